@@ -1,0 +1,113 @@
+// Checked access to byte buffers that came from outside.
+//
+// A load names the buffer and an offset; it yields nothing when the value would not lie wholly
+// inside. Offsets are 64-bit so that no sum of 32-bit fields can wrap before it is checked.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+#include <optional>
+#include <span>
+#include <string_view>
+
+namespace tavrel {
+
+using ByteSpan = std::span<const std::byte>;
+using MutableByteSpan = std::span<std::byte>;
+
+/// The part of `bytes` from `offset` of `length` bytes, or nothing when it is not all there.
+constexpr std::optional<ByteSpan> slice(ByteSpan bytes, std::uint64_t offset,
+                                        std::uint64_t length) {
+  if (offset > bytes.size() || length > bytes.size() - offset) return std::nullopt;
+  return bytes.subspan(static_cast<std::size_t>(offset), static_cast<std::size_t>(length));
+}
+
+namespace bytes_detail {
+
+template <class Word>
+constexpr Word assembleLittle(const std::byte* at) {
+  std::uint64_t word = 0;
+  for (std::size_t i = 0; i < sizeof(Word); ++i) {
+    word |= std::to_integer<std::uint64_t>(at[i]) << (8 * i);
+  }
+  return static_cast<Word>(word);
+}
+
+template <class Word>
+constexpr Word assembleBig(const std::byte* at) {
+  std::uint64_t word = 0;
+  for (std::size_t i = 0; i < sizeof(Word); ++i) {
+    word = word << 8 | std::to_integer<std::uint64_t>(at[i]);
+  }
+  return static_cast<Word>(word);
+}
+
+template <class Word>
+constexpr std::optional<Word> loadLittle(ByteSpan bytes, std::uint64_t offset) {
+  const auto part = slice(bytes, offset, sizeof(Word));
+  if (!part) return std::nullopt;
+  return assembleLittle<Word>(part->data());
+}
+
+template <class Word>
+constexpr std::optional<Word> loadBig(ByteSpan bytes, std::uint64_t offset) {
+  const auto part = slice(bytes, offset, sizeof(Word));
+  if (!part) return std::nullopt;
+  return assembleBig<Word>(part->data());
+}
+
+template <class Word>
+constexpr bool storeLittle(MutableByteSpan bytes, std::uint64_t offset, Word word) {
+  if (!slice(bytes, offset, sizeof(Word))) return false;
+  for (std::size_t i = 0; i < sizeof(Word); ++i) {
+    bytes[static_cast<std::size_t>(offset) + i] =
+        static_cast<std::byte>(static_cast<std::uint64_t>(word) >> (8 * i));
+  }
+  return true;
+}
+
+}  // namespace bytes_detail
+
+constexpr std::optional<std::uint8_t> loadByte(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadLittle<std::uint8_t>(bytes, offset);
+}
+constexpr std::optional<std::uint16_t> loadLittle16(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadLittle<std::uint16_t>(bytes, offset);
+}
+constexpr std::optional<std::uint32_t> loadLittle32(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadLittle<std::uint32_t>(bytes, offset);
+}
+constexpr std::optional<std::uint64_t> loadLittle64(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadLittle<std::uint64_t>(bytes, offset);
+}
+constexpr std::optional<std::uint16_t> loadBig16(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadBig<std::uint16_t>(bytes, offset);
+}
+constexpr std::optional<std::uint32_t> loadBig32(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadBig<std::uint32_t>(bytes, offset);
+}
+constexpr std::optional<std::uint64_t> loadBig64(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadBig<std::uint64_t>(bytes, offset);
+}
+
+/// The stores answer false, and write nothing, when the word would not fit.
+constexpr bool storeLittle16(MutableByteSpan bytes, std::uint64_t offset, std::uint16_t word) {
+  return bytes_detail::storeLittle(bytes, offset, word);
+}
+constexpr bool storeLittle32(MutableByteSpan bytes, std::uint64_t offset, std::uint32_t word) {
+  return bytes_detail::storeLittle(bytes, offset, word);
+}
+constexpr bool storeLittle64(MutableByteSpan bytes, std::uint64_t offset, std::uint64_t word) {
+  return bytes_detail::storeLittle(bytes, offset, word);
+}
+
+inline ByteSpan asBytes(std::string_view text) {
+  return std::as_bytes(std::span(text.data(), text.size()));
+}
+
+inline std::string_view asText(ByteSpan bytes) {
+  return {reinterpret_cast<const char*>(bytes.data()), bytes.size()};
+}
+
+}  // namespace tavrel

@@ -1,0 +1,40 @@
+// The outcome of an operation that yields a value or says why it could not.
+#pragma once
+
+#include <string>
+#include <utility>
+#include <variant>
+
+namespace tavrel {
+
+/// A reason that a person can read: what failed, where, and the system's own words if it had any.
+struct Error {
+  std::string message;
+};
+
+/// Holds a `T` or an `Error`. Test it before taking the value.
+template <class T>
+class [[nodiscard]] Expected {
+ public:
+  Expected(T value) : state_(std::in_place_index<0>, std::move(value)) {}
+  Expected(Error error) : state_(std::in_place_index<1>, std::move(error)) {}
+
+  explicit operator bool() const { return state_.index() == 0; }
+
+  T& operator*() & { return std::get<0>(state_); }
+  const T& operator*() const& { return std::get<0>(state_); }
+  T&& operator*() && { return std::get<0>(std::move(state_)); }
+  T* operator->() { return &std::get<0>(state_); }
+  const T* operator->() const { return &std::get<0>(state_); }
+
+  const Error& error() const { return std::get<1>(state_); }
+
+ private:
+  std::variant<T, Error> state_;
+};
+
+/// The outcome of an operation that has nothing to yield.
+struct Done {};
+using Status = Expected<Done>;
+
+}  // namespace tavrel

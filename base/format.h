@@ -1,0 +1,150 @@
+// printf-style formatting with objects, exact to the character with what C's printf prints.
+//
+//   std::string line = format("daily tasks for day %d", day);
+//   appendFormat(out, "%{public}@: %5.2f", object, value);
+//
+// Formats that are literals are checked against their arguments while the program is compiled.
+// Format texts that a device supplies go through `appendForeignFormat`, which refuses a text that
+// asks for other arguments than it is given. No argument is ever read that is not there.
+//
+// Beyond C: "%@" prints an object's text (base/text.h), "(null)" for a null one; not-a-number has
+// no sign; a null text prints "(null)" whatever the precision. The locale is always C's.
+#pragma once
+
+#include <array>
+#include <concepts>
+#include <cstdint>
+#include <span>
+#include <string>
+#include <string_view>
+#include <type_traits>
+#include <variant>
+
+#include "base/expected.h"
+#include "base/format_directive.h"
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// One argument. It borrows texts; it must not outlive the call.
+class FormatArgument {
+ public:
+  template <std::integral Integer>
+  requires(sizeof(Integer) <= 4) FormatArgument(Integer value)
+      : value_(static_cast<std::uint32_t>(value)) {}
+  template <std::integral Integer>
+  requires(sizeof(Integer) == 8) FormatArgument(Integer value)
+      : value_(static_cast<std::uint64_t>(value)) {}
+  FormatArgument(double value) : value_(value) {}
+  FormatArgument(std::string_view text) : value_(text) {}
+  FormatArgument(const std::string& text) : value_(std::string_view(text)) {}
+  /// A null pointer prints as "(null)".
+  FormatArgument(const char* text) {
+    if (text) {
+      value_ = std::string_view(text);
+    } else {
+      value_ = NullText{};
+    }
+  }
+  FormatArgument(const plist::String& text) : value_(text.view()) {}
+  FormatArgument(const plist::Value& object) : value_(object) {}
+  FormatArgument(const plist::Dictionary& object) : value_(plist::Value(object)) {}
+  FormatArgument(const plist::Array& object) : value_(plist::Value(object)) {}
+  FormatArgument(const plist::Data& object) : value_(plist::Value(object)) {}
+  FormatArgument(plist::Date object) : value_(plist::Value(object)) {}
+  FormatArgument(const void* pointer) : value_(pointer) {}
+
+  struct NullText {};
+  using Alternatives = std::variant<std::uint32_t, std::uint64_t, double, std::string_view,
+                                    NullText, const void*, plist::Value>;
+
+  ArgumentType type() const {
+    static constexpr ArgumentType kTypes[] = {
+        ArgumentType::Int,  ArgumentType::Long,    ArgumentType::Double, ArgumentType::Text,
+        ArgumentType::Text, ArgumentType::Pointer, ArgumentType::Object};
+    return kTypes[value_.index()];
+  }
+  const Alternatives& value() const { return value_; }
+
+ private:
+  Alternatives value_;
+};
+
+/// The type that an argument of C++ type `T` has in a format.
+template <class T>
+constexpr ArgumentType argumentTypeOf() {
+  using Plain = std::decay_t<T>;
+  if constexpr (std::integral<Plain>) {
+    return sizeof(Plain) == 8 ? ArgumentType::Long : ArgumentType::Int;
+  } else if constexpr (std::floating_point<Plain>) {
+    return ArgumentType::Double;
+  } else if constexpr (std::convertible_to<Plain, std::string_view>) {
+    return ArgumentType::Text;
+  } else if constexpr (std::is_pointer_v<Plain>) {
+    return ArgumentType::Pointer;
+  } else {
+    return ArgumentType::Object;
+  }
+}
+
+/// A format literal whose directives agree with arguments of the types `Arguments`.
+template <class... Arguments>
+class CheckedFormat {
+ public:
+  template <std::size_t N>
+  consteval CheckedFormat(const char (&text)[N]) : text_(text, N - 1) {
+    constexpr std::array<ArgumentType, sizeof...(Arguments)> kTypes{argumentTypeOf<Arguments>()...};
+    std::size_t next = 0;
+    const auto expect = [&](const Directive& directive) {
+      if (next == kTypes.size()) throw "the format asks for more arguments than it is given";
+      if (!accepts(directive, kTypes[next++])) throw "the format and its argument do not agree";
+    };
+    std::string_view rest = text_;
+    while (true) {
+      const std::size_t percent = rest.find('%');
+      if (percent == std::string_view::npos) break;
+      rest.remove_prefix(percent + 1);
+      const auto directive = takeDirective(rest);
+      if (!directive) throw "not a conversion";
+      Directive star;
+      star.conversion = 'd';
+      if (directive->widthFromArgument) expect(star);
+      if (directive->precisionFromArgument) expect(star);
+      if (directive->conversion != '%') expect(*directive);
+    }
+    if (next != kTypes.size()) throw "the format does not use all of its arguments";
+  }
+
+  constexpr std::string_view text() const { return text_; }
+
+ private:
+  std::string_view text_;
+};
+
+template <class... Arguments>
+using FormatOf = CheckedFormat<std::type_identity_t<Arguments>...>;
+
+/// Appends the formatted text. On failure nothing is appended and the error says which directive
+/// is wrong and why.
+Status appendForeignFormat(std::string& out, std::string_view format,
+                           std::span<const FormatArgument> arguments);
+
+namespace format_detail {
+void appendChecked(std::string& out, std::string_view format,
+                   std::span<const FormatArgument> arguments);
+}  // namespace format_detail
+
+template <class... Arguments>
+void appendFormat(std::string& out, FormatOf<Arguments...> text, const Arguments&... arguments) {
+  const std::array<FormatArgument, sizeof...(Arguments)> list{FormatArgument(arguments)...};
+  format_detail::appendChecked(out, text.text(), list);
+}
+
+template <class... Arguments>
+std::string format(FormatOf<Arguments...> text, const Arguments&... arguments) {
+  std::string out;
+  appendFormat(out, text, arguments...);
+  return out;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,160 @@
+// One conversion of a printf-style format: how it is read and which argument it takes.
+//
+// Everything here is constexpr: literals of the program are checked while it is compiled, format
+// texts that come from outside while they are used.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string_view>
+
+#include "base/limits.h"
+
+namespace tavrel {
+
+/// What a format can be given. `Int` has 32 bits (narrower integers are promoted), `Long` 64.
+enum class ArgumentType : std::uint8_t { Int, Long, Double, Text, Pointer, Object };
+
+/// "%[flags][width][.precision][length]conversion". "%{public}@" and the like carry an annotation
+/// in braces, which has no effect on the text.
+struct Directive {
+  bool leftAlign = false;      // -
+  bool plusSign = false;       // +
+  bool blankSign = false;      // blank
+  bool alternateForm = false;  // #
+  bool zeroPad = false;        // 0
+  bool widthFromArgument = false;
+  bool precisionFromArgument = false;
+  std::int32_t width = 0;
+  std::optional<std::int32_t> precision;
+  unsigned char lengthBits = 32;  // of an integer: 8 (hh), 16 (h), 32, 64 (l, ll, j, z, t, q)
+  char conversion = 0;
+};
+
+namespace format_detail {
+
+constexpr bool isOneOf(char c, std::string_view set) {
+  return set.find(c) != std::string_view::npos;
+}
+
+constexpr char frontOf(std::string_view text) {
+  return text.empty() ? '\0' : text.front();
+}
+
+constexpr bool take(std::string_view& text, std::string_view prefix) {
+  if (!text.starts_with(prefix)) return false;
+  text.remove_prefix(prefix.size());
+  return true;
+}
+
+// Digits up to the largest width; nothing when the number is larger.
+constexpr std::optional<std::int32_t> takeNumber(std::string_view& text) {
+  std::int32_t number = 0;
+  while (frontOf(text) >= '0' && frontOf(text) <= '9') {
+    number = number * 10 + (text.front() - '0');
+    if (number > limits::kLargestFormatWidth) return std::nullopt;
+    text.remove_prefix(1);
+  }
+  return number;
+}
+
+constexpr void takeFlags(std::string_view& text, Directive& directive) {
+  for (;; text.remove_prefix(1)) {
+    switch (frontOf(text)) {
+      case '-':
+        directive.leftAlign = true;
+        break;
+      case '+':
+        directive.plusSign = true;
+        break;
+      case ' ':
+        directive.blankSign = true;
+        break;
+      case '#':
+        directive.alternateForm = true;
+        break;
+      case '0':
+        directive.zeroPad = true;
+        break;
+      default:
+        return;
+    }
+  }
+}
+
+constexpr void takeLength(std::string_view& text, Directive& directive) {
+  if (take(text, "hh")) {
+    directive.lengthBits = 8;
+  } else if (take(text, "h")) {
+    directive.lengthBits = 16;
+  } else if (take(text, "ll") || isOneOf(frontOf(text), "ljztq")) {
+    if (isOneOf(frontOf(text), "ljztq")) text.remove_prefix(1);
+    directive.lengthBits = 64;
+  }
+}
+
+}  // namespace format_detail
+
+/// Takes one directive off the front of `text`, which begins behind the "%". Nothing when it is
+/// incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit.
+constexpr std::optional<Directive> takeDirective(std::string_view& text) {
+  using namespace format_detail;
+  Directive directive;
+  if (take(text, "{")) {
+    const std::size_t close = text.find('}');
+    if (close == std::string_view::npos) return std::nullopt;
+    text.remove_prefix(close + 1);
+  }
+  takeFlags(text, directive);
+  if (take(text, "*")) {
+    directive.widthFromArgument = true;
+  } else if (const auto width = takeNumber(text)) {
+    directive.width = *width;
+  } else {
+    return std::nullopt;
+  }
+  if (take(text, ".")) {
+    if (take(text, "*")) {
+      directive.precisionFromArgument = true;
+    } else if (const auto precision = takeNumber(text)) {
+      directive.precision = *precision;
+    } else {
+      return std::nullopt;
+    }
+  }
+  takeLength(text, directive);
+  directive.conversion = frontOf(text);
+  if (directive.conversion == '\0' || !isOneOf(directive.conversion, "diouxXcsp@eEfFgGaA%")) {
+    return std::nullopt;
+  }
+  text.remove_prefix(1);
+  return directive;
+}
+
+/// True when the directive may be given an argument of that type: the widths of integers must
+/// agree, their signedness need not. "%@" takes texts as well as objects.
+constexpr bool accepts(const Directive& directive, ArgumentType type) {
+  switch (directive.conversion) {
+    case 'd':
+    case 'i':
+    case 'o':
+    case 'u':
+    case 'x':
+    case 'X':
+      return type == (directive.lengthBits == 64 ? ArgumentType::Long : ArgumentType::Int);
+    case 'c':
+      return type == ArgumentType::Int && directive.lengthBits == 32;
+    case 's':
+      return type == ArgumentType::Text && directive.lengthBits == 32;
+    case 'p':
+      return type == ArgumentType::Pointer;
+    case '@':
+      return type == ArgumentType::Object || type == ArgumentType::Text;
+    case '%':
+      return false;
+    default:
+      return type == ArgumentType::Double;  // "%lf" is the same as "%f"
+  }
+}
+
+}  // namespace tavrel

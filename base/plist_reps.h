@@ -1,0 +1,50 @@
+// What the handles of base/plist.h point to. For the value implementation only.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel::plist::detail {
+
+/// Followed in memory by `length` bytes of text.
+struct StringRep : Shared {
+  explicit StringRep(std::size_t textLength) : Shared(Kind::String), length(textLength) {}
+  std::size_t length;
+  const char* text() const { return reinterpret_cast<const char*>(this + 1); }
+};
+
+struct DataRep : Shared {
+  DataRep() : Shared(Kind::Data) {}
+  std::vector<std::byte> bytes;
+};
+
+struct ArrayRep : Shared {
+  ArrayRep() : Shared(Kind::Array) {}
+  std::vector<Value> values;
+};
+
+/// Entries in the order of insertion. A removed entry stays, with a null value, until half of the
+/// entries are removed ones. Small dictionaries are searched from the front; larger ones have an
+/// open-addressing table of entry numbers.
+struct DictionaryRep : Shared {
+  DictionaryRep() : Shared(Kind::Dictionary) {}
+
+  Entry* find(std::string_view key);
+  void set(std::string_view key, const String* sharedKey, Value value);
+  bool remove(std::string_view key);
+  std::size_t size() const { return entries.size() - removed; }
+
+  std::vector<Entry> entries;
+  std::vector<std::uint32_t> slots;  // entry number + 1, 0 for a free slot; a power of two
+  std::uint32_t removed = 0;
+
+ private:
+  void append(Entry entry);
+  void rebuild();
+  void index(std::uint32_t entryNumber);
+};
+
+}  // namespace tavrel::plist::detail

@@ -1,0 +1,34 @@
+// The text of values as people and the receiving side read it.
+//
+// Strings and numbers stand plain, booleans as 1 and 0, dates as "2026-11-16 18:02:18 +0000", data
+// as hexadecimal in angle brackets, containers on one line in JSON's manner, in which strings,
+// dates and data are quoted. A null object is "(null)".
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// The shortest decimal text that reads back to the same double; integers have no point. Ends of
+/// the range are "inf" and "-inf", not-a-number is "nan" whatever its sign.
+std::string numberText(double value);
+std::string numberText(const plist::Number& value);
+
+/// "2026-11-16 18:02:18 +0000", in UTC, fractions of a second dropped. Instants that no calendar
+/// reaches are given as a number of seconds since 1970 behind "@".
+std::string dateText(plist::Date date);
+
+/// Lower-case hexadecimal, two digits a byte.
+void appendHex(std::string& out, ByteSpan bytes);
+
+/// `text` between quotation marks, escaped as JSON does; malformed UTF-8 is repaired.
+void appendQuoted(std::string& out, std::string_view text);
+
+void appendText(std::string& out, const plist::Value& value);
+std::string textOf(const plist::Value& value);
+
+}  // namespace tavrel

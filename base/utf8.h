@@ -1,0 +1,25 @@
+// UTF-8: validation, and reading text code point by code point.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace tavrel {
+
+inline constexpr char32_t kReplacementCharacter = 0xFFFD;
+
+/// Takes the next code point off the front of `text`, which must not be empty. A byte that begins
+/// no well-formed sequence is taken alone and yields the replacement character.
+char32_t takeCodePoint(std::string_view& text);
+
+/// True when `text` is well-formed UTF-8 (shortest forms, no surrogates).
+bool isValidUtf8(std::string_view text);
+
+/// Appends a code point; surrogates and numbers beyond U+10FFFF become the replacement character.
+void appendCodePoint(std::string& out, char32_t codePoint);
+
+/// `text` with every malformed byte replaced by the replacement character.
+std::string repairedUtf8(std::string_view text);
+
+}  // namespace tavrel

@@ -1,0 +1,23 @@
+// The main event loop.
+#pragma once
+
+#include <chrono>
+
+namespace tavrel {
+
+class EventLoop {
+ public:
+  enum class Slice {
+    HandledEvent,  // an event source was handled before the time ran out
+    TimedOut,      // the slice ran its full time without an event
+    Terminated,    // the system asked the process to end
+  };
+
+  virtual ~EventLoop() = default;
+
+  /// Waits for events until one has been handled or the time is over, in its full length also
+  /// when there is nothing to wait for.
+  virtual Slice runSlice(std::chrono::milliseconds longest) = 0;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,39 @@
+// Every service that the system needs of an operating system, in one bundle of references.
+//
+// It is built once, by main, over the services of one platform. An operation that needs several
+// services takes `Platform&`; one that needs a single service takes that service.
+#pragma once
+
+#include "platform/clock.h"
+#include "platform/crash_reporting.h"
+#include "platform/device_answers.h"
+#include "platform/digest.h"
+#include "platform/event_loop.h"
+#include "platform/files.h"
+#include "platform/preferences.h"
+#include "platform/process_state.h"
+#include "platform/property_list_coding.h"
+#include "platform/statistics_store.h"
+#include "platform/submission.h"
+#include "platform/system_log.h"
+#include "platform/system_version.h"
+
+namespace tavrel {
+
+struct Platform {
+  Clock& clock;
+  CrashReporting& crashReporting;
+  DeviceAnswers& deviceAnswers;
+  Digest& digest;
+  EventLoop& eventLoop;
+  Files& files;
+  Preferences& preferences;
+  PropertyListCoding& propertyLists;
+  StatisticsStore& statistics;
+  SubmissionService& submission;
+  SystemLog& log;
+  SystemVersion& systemVersion;
+  ProcessState& state;
+};
+
+}  // namespace tavrel

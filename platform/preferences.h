@@ -1,0 +1,39 @@
+// Preferences: values by key, kept per domain.
+//
+// A write is visible to this process at once and durable once its domain is synchronised. Values
+// read are the caller's own.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+class Preferences {
+ public:
+  virtual ~Preferences() = default;
+
+  /// Null when the key is absent or its domain cannot be read.
+  virtual plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) = 0;
+
+  /// Stores `value`; a null value removes the key.
+  virtual void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
+                                      std::string_view domain) = 0;
+
+  /// Writes the domain through to storage and takes in what other processes have written. False
+  /// when the domain could not be written; its changes are then kept for the next attempt.
+  virtual bool ZTXPreferencesSynchronize(std::string_view domain) = 0;
+
+  /// The value as an integer, 0 when it is absent or no number. `keyExistsAndHasValidFormat`
+  /// tells the cases apart.
+  std::int64_t ZTXPreferencesGetIntegerValue(std::string_view key, std::string_view domain,
+                                             bool* keyExistsAndHasValidFormat = nullptr);
+
+  /// The value when it is a boolean, else false.
+  bool ZTXPreferencesGetBoolValue(std::string_view key, std::string_view domain,
+                                  bool* keyExistsAndHasValidFormat = nullptr);
+};
+
+}  // namespace tavrel

@@ -1,0 +1,94 @@
+// The device's statistics store: named scalars and distributions, kept per day.
+//
+// `StatisticsStore` is the client that writes and knows the calendar; `BHHistory` reads what was
+// kept. A day is a number of days since 1970-01-01, UTC.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <span>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// Yields the values of one distribution row in the order in which they were recorded. Values are
+/// fetched from the store in blocks, and only when asked for.
+class BHHistoryDistributionEnumerator {
+ public:
+  struct Sample {
+    double value;
+    std::uint32_t secondsInDayOffset;
+  };
+
+  virtual ~BHHistoryDistributionEnumerator() = default;
+
+  /// True with the next value and its offset in seconds within the day; false when none is left.
+  bool getNextValue(double& value, std::uint32_t& secondsInDayOffset) {
+    if (next_ == end_) {
+      const auto block = nextBlock();
+      if (block.empty()) return false;
+      next_ = block.data();
+      end_ = next_ + block.size();
+    }
+    value = next_->value;
+    secondsInDayOffset = next_->secondsInDayOffset;
+    ++next_;
+    return true;
+  }
+
+ protected:
+  /// The next values, which stay valid until the next call; empty when none is left.
+  virtual std::span<const Sample> nextBlock() = 0;
+
+ private:
+  const Sample* next_ = nullptr;
+  const Sample* end_ = nullptr;
+};
+
+/// A reader of the store. Queries select the rows whose key begins with the prefix and whose day
+/// lies above `minDaysSince1970` and not above `maxDaysSince1970`. Rows arrive ordered by key
+/// (bytewise), then by day, before the query returns; the handler may set `stop` to end it early.
+class BHHistory {
+ public:
+  using ScalarRowHandler =
+      std::function<void(std::string_view key, std::int32_t day, std::int64_t value, bool& stop)>;
+  /// The enumerator is valid during the call.
+  using DistributionRowHandler = std::function<void(
+      std::string_view key, std::int32_t day, BHHistoryDistributionEnumerator& values, bool& stop)>;
+
+  virtual ~BHHistory() = default;
+
+  virtual void scalarsForKeyPrefix(std::string_view prefix, std::int32_t minDaysSince1970,
+                                   std::int32_t maxDaysSince1970,
+                                   const ScalarRowHandler& rowHandler) = 0;
+  virtual void distributionsForKeyPrefix(std::string_view prefix, std::int32_t minDaysSince1970,
+                                         std::int32_t maxDaysSince1970,
+                                         const DistributionRowHandler& rowHandler) = 0;
+};
+
+class StatisticsStore {
+ public:
+  virtual ~StatisticsStore() = default;
+
+  /// Today's day number.
+  virtual std::int32_t BHDaysSince1970() = 0;
+
+  /// The instant at which a day begins.
+  virtual plist::Date dateForDaysSince1970(std::int32_t day) = 0;
+
+  /// Commits the values set so far and moves the write-ahead log into the database.
+  virtual void BHClientCheckpoint() = 0;
+
+  /// Sets today's value of a scalar. Values are committed together, at the next checkpoint and at
+  /// the end of the run.
+  virtual void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
+
+  /// The history at its default location. A store that cannot be read has been reported to the
+  /// system log and gives a history without rows.
+  virtual std::unique_ptr<BHHistory> initWithDefaultPath() = 0;
+};
+
+}  // namespace tavrel

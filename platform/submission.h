@@ -1,0 +1,50 @@
+// The diagnostic-log submission service: may logs leave the device, and the way out for them.
+#pragma once
+
+#include <functional>
+#include <string>
+#include <string_view>
+
+#include "base/bytes.h"
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// A new log file, open for writing.
+class LogFile {
+ public:
+  virtual ~LogFile() = default;
+  /// Writes all of `bytes`. A failure makes the submission fail; further writes are ignored.
+  virtual void write(ByteSpan bytes) = 0;
+};
+
+class SubmissionService {
+ public:
+  using LogWriter = std::function<void(LogFile&)>;
+
+  virtual ~SubmissionService() = default;
+
+  /// Whether the user allows diagnostic submission.
+  virtual bool isDiagnosticSubmissionEnabled() = 0;
+
+  /// Whether internal diagnostics are enabled for the identifier.
+  virtual bool hasInternalDiagnostics(std::string_view identifier) = 0;
+
+  /// Files a log for upload: opens it, has `writer` fill it, and makes it appear in one step. An
+  /// empty `options` handle means none. False when the log could not be filed; nothing of it is
+  /// then left, and the system log has the reason.
+  virtual bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
+                                        const plist::Dictionary& options,
+                                        const LogWriter& writer) = 0;
+
+  /// "name version (build)".
+  virtual std::string ZTXOSVersion() = 0;
+
+  /// A value that remote tasking sets; null when absent.
+  virtual plist::Value ZTXGetDATaskingValue(std::string_view key) = 0;
+
+  /// Sends the pending logs on at once.
+  virtual void submitDiagnosticLogs() = 0;
+};
+
+}  // namespace tavrel
