@@ -58,13 +58,17 @@ std::int64_t daysFromCivil(const CivilDate& date) {
 
 CivilTime civilFromSeconds(std::int64_t seconds) {
   const std::int64_t days = floorDivide(seconds, kSecondsPerDay);
-  const auto secondOfDay = static_cast<unsigned>(seconds - days * kSecondsPerDay);
+  const std::int64_t remainder = seconds % kSecondsPerDay;
+  const auto secondOfDay =
+      static_cast<unsigned>(remainder < 0 ? remainder + kSecondsPerDay : remainder);
   return {civilFromDays(days), secondOfDay / 3600, secondOfDay / 60 % 60, secondOfDay % 60};
 }
 
 std::int64_t secondsFromCivil(const CivilTime& time) {
-  return daysFromCivil(time.date) * kSecondsPerDay + time.hour * 3600 + time.minute * 60 +
-         time.second;
+  // The first day of the 64-bit range is not wholly inside it.
+  const auto days = static_cast<std::uint64_t>(daysFromCivil(time.date));
+  return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600 + time.minute * 60 +
+                                   time.second);
 }
 
 bool isValid(const CivilDate& date) {
@@ -85,6 +89,7 @@ std::string dateText(const CivilDate& date) {
 }
 
 std::optional<CivilDate> parseDate(std::string_view text) {
+  const std::string_view whole = text;
   const bool negative = text.starts_with('-');
   if (negative) text.remove_prefix(1);
   if (text.size() < 10 || text.size() > 16) return std::nullopt;
@@ -96,7 +101,7 @@ std::optional<CivilDate> parseDate(std::string_view text) {
   if (!year || !month || !day) return std::nullopt;
   const CivilDate date{negative ? -*year : *year, static_cast<unsigned>(*month),
                        static_cast<unsigned>(*day)};
-  if (!isValid(date)) return std::nullopt;
+  if (!isValid(date) || dateText(date) != whole) return std::nullopt;
   return date;
 }
 

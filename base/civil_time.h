@@ -33,7 +33,7 @@ struct CivilTime {
 CivilDate civilFromDays(std::int64_t days);
 std::int64_t daysFromCivil(const CivilDate& date);
 
-/// Seconds since 1970-01-01 00:00:00 UTC to the fields of a date and back.
+/// Seconds since 1970-01-01 00:00:00 UTC to the fields of a date and back, for any 64-bit instant.
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 

@@ -7,8 +7,9 @@
 // Format texts that a device supplies go through `appendForeignFormat`, which refuses a text that
 // asks for other arguments than it is given. No argument is ever read that is not there.
 //
-// Beyond C: "%@" prints an object's text (base/text.h), "(null)" for a null one; not-a-number has
-// no sign; a null text prints "(null)" whatever the precision. The locale is always C's.
+// Beyond C: "%@" prints an object's text (base/text.h), "(null)" for a null one, with width and
+// precision in bytes as for "%s"; not-a-number has no sign; a null text prints "(null)" whatever
+// the precision. The locale is always C's. Texts may hold zero bytes.
 #pragma once
 
 #include <array>
@@ -26,7 +27,8 @@
 
 namespace tavrel {
 
-/// One argument. It borrows texts; it must not outlive the call.
+/// One argument. It borrows texts, which must outlive the call and must not lie in the string that
+/// is appended to.
 class FormatArgument {
  public:
   template <std::integral Integer>
@@ -36,6 +38,7 @@ class FormatArgument {
   requires(sizeof(Integer) == 8) FormatArgument(Integer value)
       : value_(static_cast<std::uint64_t>(value)) {}
   FormatArgument(double value) : value_(value) {}
+  FormatArgument(float value) : value_(static_cast<double>(value)) {}
   FormatArgument(std::string_view text) : value_(text) {}
   FormatArgument(const std::string& text) : value_(std::string_view(text)) {}
   /// A null pointer prints as "(null)".
@@ -74,6 +77,7 @@ class FormatArgument {
 template <class T>
 constexpr ArgumentType argumentTypeOf() {
   using Plain = std::decay_t<T>;
+  static_assert(!std::is_enum_v<Plain>, "convert an enumerator to the integer that is meant");
   if constexpr (std::integral<Plain>) {
     return sizeof(Plain) == 8 ? ArgumentType::Long : ArgumentType::Int;
   } else if constexpr (std::floating_point<Plain>) {
@@ -94,25 +98,11 @@ class CheckedFormat {
   template <std::size_t N>
   consteval CheckedFormat(const char (&text)[N]) : text_(text, N - 1) {
     constexpr std::array<ArgumentType, sizeof...(Arguments)> kTypes{argumentTypeOf<Arguments>()...};
-    std::size_t next = 0;
-    const auto expect = [&](const Directive& directive) {
-      if (next == kTypes.size()) throw "the format asks for more arguments than it is given";
-      if (!accepts(directive, kTypes[next++])) throw "the format and its argument do not agree";
-    };
-    std::string_view rest = text_;
-    while (true) {
-      const std::size_t percent = rest.find('%');
-      if (percent == std::string_view::npos) break;
-      rest.remove_prefix(percent + 1);
-      const auto directive = takeDirective(rest);
-      if (!directive) throw "not a conversion";
-      Directive star;
-      star.conversion = 'd';
-      if (directive->widthFromArgument) expect(star);
-      if (directive->precisionFromArgument) expect(star);
-      if (directive->conversion != '%') expect(*directive);
-    }
-    if (next != kTypes.size()) throw "the format does not use all of its arguments";
+    const FormatFault fault = checkFormat(text_, kTypes);
+    if (fault == FormatFault::NotAConversion) throw "not a conversion";
+    if (fault == FormatFault::WrongArgument) throw "the format and its argument do not agree";
+    if (fault == FormatFault::MissingArgument) throw "the format asks for more arguments";
+    if (fault == FormatFault::UnusedArgument) throw "the format does not use all its arguments";
   }
 
   constexpr std::string_view text() const { return text_; }
@@ -125,7 +115,8 @@ template <class... Arguments>
 using FormatOf = CheckedFormat<std::type_identity_t<Arguments>...>;
 
 /// Appends the formatted text. On failure nothing is appended and the error says which directive
-/// is wrong and why.
+/// is wrong and why. Widths and precisions are limited (limits::kLargestFormatWidth) also when they
+/// come from an argument, so that the text stays in proportion to the number of arguments.
 Status appendForeignFormat(std::string& out, std::string_view format,
                            std::span<const FormatArgument> arguments);
 
@@ -134,6 +125,7 @@ void appendChecked(std::string& out, std::string_view format,
                    std::span<const FormatArgument> arguments);
 }  // namespace format_detail
 
+/// Appends the formatted text of a literal. A width that an argument gives ends at the limit.
 template <class... Arguments>
 void appendFormat(std::string& out, FormatOf<Arguments...> text, const Arguments&... arguments) {
   const std::array<FormatArgument, sizeof...(Arguments)> list{FormatArgument(arguments)...};

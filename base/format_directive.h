@@ -4,8 +4,10 @@
 // texts that come from outside while they are used.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
+#include <span>
 #include <string_view>
 
 #include "base/limits.h"
@@ -26,7 +28,7 @@ struct Directive {
   bool widthFromArgument = false;
   bool precisionFromArgument = false;
   std::int32_t width = 0;
-  std::optional<std::int32_t> precision;
+  std::optional<std::int32_t> precision = std::nullopt;
   unsigned char lengthBits = 32;  // of an integer: 8 (hh), 16 (h), 32, 64 (l, ll, j, z, t, q)
   char conversion = 0;
 };
@@ -34,11 +36,24 @@ struct Directive {
 namespace format_detail {
 
 constexpr bool isOneOf(char c, std::string_view set) {
-  return set.find(c) != std::string_view::npos;
+  for (const char member : set) {
+    if (member == c) return true;
+  }
+  return false;
+}
+
+constexpr bool isConversion(char c) {
+  return isOneOf(c, "diouxXcsp@eEfFgGaA%");
 }
 
 constexpr char frontOf(std::string_view text) {
   return text.empty() ? '\0' : text.front();
+}
+
+constexpr bool takeOneOf(std::string_view& text, std::string_view set) {
+  if (!isOneOf(frontOf(text), set)) return false;
+  text.remove_prefix(1);
+  return true;
 }
 
 constexpr bool take(std::string_view& text, std::string_view prefix) {
@@ -47,7 +62,8 @@ constexpr bool take(std::string_view& text, std::string_view prefix) {
   return true;
 }
 
-// Digits up to the largest width; nothing when the number is larger.
+// Digits up to the largest width; nothing when the number is larger, with `text` at the digit that
+// made it so.
 constexpr std::optional<std::int32_t> takeNumber(std::string_view& text) {
   std::int32_t number = 0;
   while (frontOf(text) >= '0' && frontOf(text) <= '9') {
@@ -87,8 +103,7 @@ constexpr void takeLength(std::string_view& text, Directive& directive) {
     directive.lengthBits = 8;
   } else if (take(text, "h")) {
     directive.lengthBits = 16;
-  } else if (take(text, "ll") || isOneOf(frontOf(text), "ljztq")) {
-    if (isOneOf(frontOf(text), "ljztq")) text.remove_prefix(1);
+  } else if (take(text, "ll") || takeOneOf(text, "ljztq")) {
     directive.lengthBits = 64;
   }
 }
@@ -96,13 +111,23 @@ constexpr void takeLength(std::string_view& text, Directive& directive) {
 }  // namespace format_detail
 
 /// Takes one directive off the front of `text`, which begins behind the "%". Nothing when it is
-/// incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit.
+/// incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit; then `text`
+/// begins with the character that is wrong, or is empty when the directive is incomplete.
 constexpr std::optional<Directive> takeDirective(std::string_view& text) {
   using namespace format_detail;
   Directive directive;
+  // Most directives are a conversion alone.
+  if (isConversion(frontOf(text))) {
+    directive.conversion = text.front();
+    text.remove_prefix(1);
+    return directive;
+  }
   if (take(text, "{")) {
     const std::size_t close = text.find('}');
-    if (close == std::string_view::npos) return std::nullopt;
+    if (close == std::string_view::npos) {
+      text = {};
+      return std::nullopt;
+    }
     text.remove_prefix(close + 1);
   }
   takeFlags(text, directive);
@@ -124,9 +149,7 @@ constexpr std::optional<Directive> takeDirective(std::string_view& text) {
   }
   takeLength(text, directive);
   directive.conversion = frontOf(text);
-  if (directive.conversion == '\0' || !isOneOf(directive.conversion, "diouxXcsp@eEfFgGaA%")) {
-    return std::nullopt;
-  }
+  if (!isConversion(directive.conversion)) return std::nullopt;
   text.remove_prefix(1);
   return directive;
 }
@@ -155,6 +178,42 @@ constexpr bool accepts(const Directive& directive, ArgumentType type) {
     default:
       return type == ArgumentType::Double;  // "%lf" is the same as "%f"
   }
+}
+
+/// What takes the argument of a "*".
+inline constexpr Directive kStar{.conversion = 'd'};
+
+enum class FormatFault : std::uint8_t {
+  None,
+  NotAConversion,
+  WrongArgument,
+  MissingArgument,
+  UnusedArgument
+};
+
+/// Compares a format with the types of all its arguments.
+constexpr FormatFault checkFormat(std::string_view text, std::span<const ArgumentType> types) {
+  std::size_t next = 0;
+  FormatFault fault = FormatFault::None;
+  const auto expect = [&](const Directive& directive) {
+    if (fault != FormatFault::None) return;
+    if (next == types.size()) {
+      fault = FormatFault::MissingArgument;
+    } else if (!accepts(directive, types[next++])) {
+      fault = FormatFault::WrongArgument;
+    }
+  };
+  for (std::size_t percent = text.find('%'); percent != std::string_view::npos;
+       percent = text.find('%')) {
+    text.remove_prefix(percent + 1);
+    const auto directive = takeDirective(text);
+    if (!directive) return FormatFault::NotAConversion;
+    if (directive->widthFromArgument) expect(kStar);
+    if (directive->precisionFromArgument) expect(kStar);
+    if (directive->conversion != '%') expect(*directive);
+    if (fault != FormatFault::None) return fault;
+  }
+  return next == types.size() ? FormatFault::None : FormatFault::UnusedArgument;
 }
 
 }  // namespace tavrel

@@ -25,13 +25,80 @@ inline constexpr std::size_t kPropertyListBytes = 64U << 20;
 /// as unreadable and keeps the run below 64 MiB of memory.
 inline constexpr std::size_t kWhitelistBytes = 4U << 20;
 
+/// Findings about one whitelist that are listed. Nobody reads more at once, and each holds a copy
+/// of its place.
+inline constexpr std::size_t kWhitelistFindings = 1000;
+
+/// Boundaries of one histogram. More counts as a failed allocation of its counters: no chart has
+/// that many bars, and a file must not decide how much memory a key costs.
+inline constexpr std::size_t kHistogramBoundaries = 65'536;
+
 /// Bytes of an allocation whose size a device decides. More counts as a failed allocation.
 inline constexpr std::uint64_t kDeviceAllocationBytes = 64U << 20;
 
 /// How long a locked statistics store is waited for, in milliseconds.
 inline constexpr int kStoreBusyMilliseconds = 10'000;
 
+/// Bytes of the name of a preference domain. Tasking supplies domains; with its endings the name
+/// must fit the 255 bytes of a file name.
+inline constexpr std::size_t kPreferenceDomainBytes = 200;
+
+/// Bytes of one preference domain's file. No value takes less than nine bytes of it, so that what
+/// was written stays below `kPropertyListValues` and can be read again.
+inline constexpr std::size_t kPreferenceFileBytes = 8U << 20;
+
+/// Bytes of one day's structured records of one type. Records come from devices; more of them on
+/// one day would wear the flash and say nothing new.
+inline constexpr std::size_t kStructuredRecordFileBytes = 16U << 20;
+
+/// Bytes of a small configuration file of the system, such as os-release.
+inline constexpr std::size_t kSystemFactBytes = 64U << 10;
+
+/// How long the lock of a file that another process writes is waited for, in milliseconds.
+inline constexpr int kFileLockMilliseconds = 10'000;
+
+/// Bytes of a key in the statistics store. Keys are names; ten times the longest that was ever
+/// seen, and short enough that a day's rows are read in little memory.
+inline constexpr std::size_t kStoreKeyBytes = 1U << 20;
+
 /// Age after which a temporary file that a killed process left behind is removed, in seconds.
 inline constexpr std::int64_t kTemporaryFileSeconds = 86'400;
+
+/// Bytes of a message that travels in a packet. The kernel's default socket buffer ends near
+/// 200 kB, and one buffer of this size serves all peers.
+inline constexpr std::size_t kPacketBytes = 64U << 10;
+
+/// Bytes of a message in a sealed memory file. 5,000 applications are about one MiB.
+inline constexpr std::size_t kMessageFileBytes = 16U << 20;
+
+/// Peers of a named service at one time. Further ones wait in the kernel's queue until one leaves.
+/// Each costs a descriptor.
+inline constexpr std::size_t kServicePeers = 2048;
+
+/// Connections in a row that sent nothing and yet prolong the service's wait. Without a bound a
+/// peer that only connects could keep the process alive for ever.
+inline constexpr int kSilentConnections = 32;
+
+/// Log lines about refused peers and messages within a minute. A peer that reconnects and sends
+/// garbage again must not fill the system log.
+inline constexpr int kRefusalLinesPerMinute = 20;
+
+/// Characters of the name of a service or a notification; it is a file name and goes into a socket
+/// address of 108 bytes.
+inline constexpr std::size_t kServiceNameBytes = 64;
+
+/// Descriptors that the service manager may hand over.
+inline constexpr int kActivationDescriptors = 64;
+
+/// Bytes of a line in a text file of the system. Package descriptions, the longest lines there are,
+/// stay far below.
+inline constexpr std::size_t kTextLineBytes = 64U << 10;
+
+/// Desktop entries that are counted. Their names are held while counting.
+inline constexpr std::size_t kDesktopEntries = 100'000;
+
+/// Languages in one list. Matching compares every preferred with every available one; the system's
+/// own list of all locales has some 500.
+inline constexpr std::size_t kLanguages = 1'000;
 
 }  // namespace tavrel::limits

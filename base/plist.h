@@ -11,8 +11,9 @@
 //
 //   if (const auto unit = channel.dictionary("Info").number("Unit")) use(unit->int64());
 //
-// Writing through an empty handle first gives it a container of its own. Dictionaries enumerate in
-// the order of insertion; nothing may be added or removed while one enumerates.
+// Writing through an empty handle first gives it a container of its own. `Array{}` is an empty
+// handle, and so null as a value; a container without elements is `Array::create()`. Dictionaries
+// enumerate in the order of insertion; nothing may be added or removed while one enumerates.
 //
 // Nothing here may be shared between threads.
 #pragma once
@@ -48,7 +49,7 @@ class Number {
   requires(!std::same_as<Integer, bool>) constexpr Number(Integer value)
       : bits_(static_cast<std::uint64_t>(value)), kind_(kindOf<Integer>()) {}
   constexpr Number(float value)
-      : bits_(std::bit_cast<std::uint64_t>(double{value})), kind_(NumberKind::Float) {}
+      : bits_(std::bit_cast<std::uint64_t>(static_cast<double>(value))), kind_(NumberKind::Float) {}
   constexpr Number(double value)
       : bits_(std::bit_cast<std::uint64_t>(value)), kind_(NumberKind::Double) {}
 

@@ -1,8 +1,8 @@
 #include <algorithm>
 #include <cstring>
-#include <functional>
 #include <new>
 
+#include "base/keyed_hash.h"
 #include "base/plist.h"
 #include "base/plist_reps.h"
 
@@ -13,10 +13,6 @@ namespace {
 
 // Up to here a walk over the entries is as fast as a table, and smaller.
 constexpr std::size_t kLargestUnindexed = 8;
-
-std::size_t hashOf(std::string_view key) {
-  return std::hash<std::string_view>{}(key);
-}
 
 }  // namespace
 
@@ -50,7 +46,7 @@ Entry* DictionaryRep::find(std::string_view key) {
     return at == entries.end() ? nullptr : &*at;
   }
   const std::size_t mask = slots.size() - 1;
-  for (std::size_t slot = hashOf(key) & mask; slots[slot] != 0; slot = (slot + 1) & mask) {
+  for (std::size_t slot = keyedHash(key) & mask; slots[slot] != 0; slot = (slot + 1) & mask) {
     Entry& entry = entries[slots[slot] - 1];
     if (!entry.value.isNull() && entry.key == key) return &entry;
   }
@@ -101,7 +97,7 @@ void DictionaryRep::rebuild() {
 
 void DictionaryRep::index(std::uint32_t entryNumber) {
   const std::size_t mask = slots.size() - 1;
-  std::size_t slot = hashOf(entries[entryNumber].key) & mask;
+  std::size_t slot = keyedHash(entries[entryNumber].key) & mask;
   while (slots[slot] != 0)
     slot = (slot + 1) & mask;
   slots[slot] = entryNumber + 1;

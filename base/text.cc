@@ -12,6 +12,9 @@ namespace {
 
 using plist::Kind;
 
+// Up to here every integer is a double, so that its digits read back to it.
+constexpr double kLargestPlainInteger = 9007199254740992.0;
+
 // Dates beyond have no 64-bit year that the calendar arithmetic is good for.
 constexpr double kLargestSeconds = 3e16;
 
@@ -69,6 +72,10 @@ void appendQuotedText(std::string& out, const plist::Value& value) {
 
 std::string numberText(double value) {
   if (std::isnan(value)) return "nan";
+  const bool negativeZero = value == 0 && std::signbit(value);
+  if (std::abs(value) <= kLargestPlainInteger && std::trunc(value) == value && !negativeZero) {
+    return integerText(static_cast<std::int64_t>(value));
+  }
   char digits[32];
   const auto [end, error] = std::to_chars(digits, digits + sizeof digits, value);
   return {digits, end};
@@ -88,7 +95,7 @@ std::string numberText(const plist::Number& value) {
 
 std::string dateText(plist::Date date) {
   const double seconds = std::floor(date.secondsSince1970());
-  if (!(std::abs(seconds) < kLargestSeconds)) return "@" + numberText(seconds);
+  if (!(std::abs(seconds) < kLargestSeconds)) return std::string("@").append(numberText(seconds));
   const CivilTime time = civilFromSeconds(static_cast<std::int64_t>(seconds));
   char clock[24];
   std::snprintf(clock, sizeof clock, " %02u:%02u:%02u +0000", time.hour, time.minute, time.second);

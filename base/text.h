@@ -13,8 +13,9 @@
 
 namespace tavrel {
 
-/// The shortest decimal text that reads back to the same double; integers have no point. Ends of
-/// the range are "inf" and "-inf", not-a-number is "nan" whatever its sign.
+/// The shortest decimal text that reads back to the same double. Integers up to 2^53 are written
+/// out, so that a double and an integer of the same value have one text. Ends of the range are
+/// "inf" and "-inf", negative zero is "-0", not-a-number is "nan" whatever its sign.
 std::string numberText(double value);
 std::string numberText(const plist::Number& value);
 

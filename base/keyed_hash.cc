@@ -1,0 +1,71 @@
+#include "base/keyed_hash.h"
+
+#include <bit>
+#include <cstring>
+#include <random>
+
+namespace tavrel {
+namespace {
+
+struct Key {
+  std::uint64_t low, high;
+};
+
+std::uint64_t randomWord(std::random_device& source) {
+  return std::uint64_t{source()} << 32 | source();
+}
+
+const Key& processKey() {
+  static const Key key = [] {
+    std::random_device source;
+    return Key{randomWord(source), randomWord(source)};
+  }();
+  return key;
+}
+
+struct SipState {
+  std::uint64_t v0, v1, v2, v3;
+
+  void round() {
+    v0 += v1;
+    v1 = std::rotl(v1, 13) ^ v0;
+    v0 = std::rotl(v0, 32);
+    v2 += v3;
+    v3 = std::rotl(v3, 16) ^ v2;
+    v0 += v3;
+    v3 = std::rotl(v3, 21) ^ v0;
+    v2 += v1;
+    v1 = std::rotl(v1, 17) ^ v2;
+    v2 = std::rotl(v2, 32);
+  }
+
+  void absorb(std::uint64_t word) {
+    v3 ^= word;
+    round();
+    v0 ^= word;
+  }
+};
+
+std::uint64_t wordAt(const char* at, std::size_t length) {
+  std::uint64_t word = 0;
+  if (length != 0) std::memcpy(&word, at, length);  // the empty text may have no address
+  return word;
+}
+
+}  // namespace
+
+std::uint64_t keyedHash(std::string_view text) {
+  const Key& key = processKey();
+  SipState state{0x736F6D6570736575 ^ key.low, 0x646F72616E646F6D ^ key.high,
+                 0x6C7967656E657261 ^ key.low, 0x7465646279746573 ^ key.high};
+  std::size_t at = 0;
+  for (; text.size() - at >= 8; at += 8)
+    state.absorb(wordAt(text.data() + at, 8));
+  state.absorb(std::uint64_t{text.size()} << 56 | wordAt(text.data() + at, text.size() - at));
+  state.v2 ^= 0xFF;
+  for (int i = 0; i < 3; ++i)
+    state.round();
+  return state.v0 ^ state.v1 ^ state.v2 ^ state.v3;
+}
+
+}  // namespace tavrel

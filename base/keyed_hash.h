@@ -1,0 +1,13 @@
+// Hashing of texts that come from outside.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+namespace tavrel {
+
+/// SipHash-1-3 under a key drawn once per process: whoever writes the texts cannot make them
+/// collide. Values differ from process to process and must not decide about any order.
+std::uint64_t keyedHash(std::string_view text);
+
+}  // namespace tavrel

@@ -1,0 +1,68 @@
+#include "base/bytes.h"
+
+#include <array>
+#include <gtest/gtest.h>
+#include <limits>
+
+#include "base/arithmetic.h"
+
+namespace tavrel {
+namespace {
+
+constexpr auto kMax64 = std::numeric_limits<std::uint64_t>::max();
+
+TEST(Bytes, LoadsOnlyWhatLiesInside) {
+  const ByteSpan bytes = asBytes("\x01\x02\x03\x04\x05\x06\x07\xF8\x09");
+  EXPECT_EQ(loadByte(bytes, 8), 0x09);
+  EXPECT_EQ(loadLittle16(bytes, 7), 0x09F8);
+  EXPECT_EQ(loadLittle32(bytes, 1), 0x05040302U);
+  EXPECT_EQ(loadLittle64(bytes, 0), 0xF807060504030201U);
+  EXPECT_EQ(loadBig16(bytes, 0), 0x0102);
+  EXPECT_EQ(loadBig32(bytes, 5), 0x0607F809U);
+  EXPECT_EQ(loadBig64(bytes, 1), 0x020304050607F809U);
+  for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64}) {
+    EXPECT_FALSE(loadByte(bytes, beyond));
+    EXPECT_FALSE(loadBig64(bytes, beyond));
+  }
+  EXPECT_FALSE(loadLittle16(bytes, 8) || loadLittle32(bytes, 6) || loadLittle64(bytes, 2));
+  EXPECT_FALSE(loadByte({}, 0));
+  EXPECT_EQ(slice(bytes, 9, 0)->size(), 0U);
+  EXPECT_EQ(asText(*slice(bytes, 0, 2)), "\x01\x02");
+  EXPECT_FALSE(slice(bytes, 10, 0) || slice(bytes, 1, kMax64) || slice(bytes, 1, 9));
+}
+
+TEST(Bytes, StoresWhollyOrNotAtAll) {
+  std::array<std::byte, 8> bytes{};
+  EXPECT_TRUE(storeLittle16(bytes, 0, 0xABCD));
+  EXPECT_TRUE(storeLittle32(bytes, 4, 0x01020304));
+  EXPECT_EQ(loadLittle64(bytes, 0), 0x010203040000ABCDU);
+  EXPECT_FALSE(storeLittle32(bytes, 5, 0) || storeLittle64(bytes, 1, 0) ||
+               storeLittle16(bytes, kMax64, 0));
+  EXPECT_EQ(loadLittle64(bytes, 0), 0x010203040000ABCDU);
+  EXPECT_TRUE(storeLittle64(bytes, 0, 0x8070605040302010));
+  EXPECT_EQ(loadLittle64(bytes, 0), 0x8070605040302010U);
+}
+
+TEST(Arithmetic, IsDefinedAtTheEnds) {
+  constexpr auto kMin = std::numeric_limits<std::int64_t>::min();
+  constexpr auto kMax = std::numeric_limits<std::int64_t>::max();
+  EXPECT_EQ(wrappingAdd(kMax, 1), kMin);
+  EXPECT_EQ(wrappingSubtract(kMin, 1), kMax);
+  EXPECT_EQ(previousDay(std::numeric_limits<std::int32_t>::min()),
+            std::numeric_limits<std::int32_t>::max());
+  EXPECT_EQ(shiftLeft(1, 63), 1UL << 63);
+  EXPECT_EQ(shiftLeft(1, 64), 0U);
+  EXPECT_EQ(shiftRight(kMax64, 63), 1U);
+  EXPECT_EQ(shiftRight(kMax64, 4000), 0U);
+  EXPECT_EQ(checkedAdd(kMax64 - 1, 1), kMax64);
+  EXPECT_FALSE(checkedAdd(kMax64, 1));
+  EXPECT_EQ(checkedMultiply(1UL << 32, (1UL << 32) - 1), kMax64 - (1UL << 32) + 1);
+  EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
+  EXPECT_EQ(checkedMultiply(0, kMax64), 0U);
+  EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);
+  EXPECT_EQ(saturatingInt64(-9223372036854775808.0), kMin);
+  EXPECT_EQ(lowInt32(0x1'FFFF'FFFFL), -1);
+}
+
+}  // namespace
+}  // namespace tavrel

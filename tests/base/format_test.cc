@@ -1,0 +1,192 @@
+#include "base/format.h"
+
+#include <cfloat>
+#include <climits>
+#include <cmath>
+#include <cstdio>
+#include <gtest/gtest.h>
+#include <limits>
+#include <string>
+#include <vector>
+
+namespace tavrel {
+namespace {
+
+template <class... Arguments>
+std::string printedByC(const std::string& format, Arguments... arguments) {
+  int (*const print)(char*, std::size_t, const char*, ...) = std::snprintf;
+  char text[5000];
+  const int length = print(text, sizeof text, format.c_str(), arguments...);
+  return {text, static_cast<std::size_t>(length)};
+}
+
+std::string printed(std::string_view format, const std::vector<FormatArgument>& arguments) {
+  std::string out;
+  const Status status = appendForeignFormat(out, format, arguments);
+  return status ? out : "error: " + status.error().message;
+}
+
+// Compares with the C library over every combination of flags, some widths and precisions.
+template <class Argument>
+void compare(const std::vector<std::string>& conversions, const std::vector<Argument>& values) {
+  for (unsigned flags = 0; flags < 32; ++flags) {
+    std::string start = "<%";
+    for (unsigned i = 0; i < 5; ++i) {
+      if (flags >> i & 1U) start += "-+ #0"[i];
+    }
+    for (const char* width : {"", "1", "6", "33"}) {
+      for (const char* precision : {"", ".", ".1", ".3", ".17", ".40"}) {
+        for (const std::string& conversion : conversions) {
+          std::string format = start;
+          format.append(width).append(precision).append(conversion).append(">");
+          for (const Argument value : values) {
+            ASSERT_EQ(printed(format, {value}), printedByC(format, value)) << format;
+          }
+        }
+      }
+    }
+  }
+}
+
+TEST(Format, PrintsAsTheCLibraryDoes) {
+  compare<int>({"d", "i", "o", "u", "x", "X", "hhd", "hhu", "hhx", "hd", "hu", "hX", "ho"},
+               {0, 1, -1, 8, 127, 128, -129, 40000, 65536, INT_MAX, INT_MIN});
+  compare<long>({"ld", "lli", "jo", "zu", "tx", "lX", "qd"},
+                {0, 1, -1, 255, 1L << 32, LONG_MAX, LONG_MIN});
+  compare<double>({"e", "E", "f", "F", "g", "G", "a", "A", "lf"},
+                  {0.0, -0.0, 1.0, -1.5, 2.5, 0.1, 1.0 / 3, 99999.95, 999999.5, -1e-5, 1e15, 1e22,
+                   DBL_MAX, DBL_MIN, 4.9e-324, INFINITY, -INFINITY, NAN});
+  compare<const char*>({"s"}, {"", "x", "longer than six"});
+  compare<int>({"c"}, {'x', '%', 0xE4});
+  int local = 0;
+  compare<const void*>({"p"}, {nullptr, &local});
+}
+
+TEST(Format, TakesWidthAndPrecisionFromArguments) {
+  for (const int width : {0, 3, 12, -12, 4096, -4096}) {
+    for (const int precision : {0, 2, 9, -1, INT_MIN}) {
+      EXPECT_EQ(format("%0*.*d|", width, precision, -42),
+                printedByC("%0*.*d|", width, precision, -42));
+      EXPECT_EQ(format("%*.*f|", width, precision, 2.5),
+                printedByC("%*.*f|", width, precision, 2.5));
+      EXPECT_EQ(format("%*.*s|", width, precision, "abc"),
+                printedByC("%*.*s|", width, precision, "abc"));
+    }
+  }
+  EXPECT_EQ(format("%.4096f", DBL_MAX).size(), 309U + 1 + 4096);
+  EXPECT_EQ(format("%*d", INT_MIN, 7), "7" + std::string(4095, ' '));
+  EXPECT_EQ(format("%*d", INT_MAX, 7), std::string(4095, ' ') + "7");
+  EXPECT_EQ(format("%.*s", INT_MAX, std::string(5000, 'x')).size(), 5000U);
+}
+
+TEST(Format, PrintsWhatCDoesNotHave) {
+  const plist::Value null;
+  const plist::Dictionary dictionary{{"a", 1}, {"b", plist::Array{"x", true, 0.5}}};
+  const char* const nullText = nullptr;
+  const double negativeNan = std::copysign(NAN, -1.0);
+  EXPECT_EQ(format("%@", dictionary), R"({"a": 1, "b": ["x", 1, 0.5]})");
+  EXPECT_EQ(format("%{public}@|%{private, mask.hash}s|%{}d", plist::Value("a"), "b", 3), "a|b|3");
+  EXPECT_EQ(format("%6@|%-6@|%2@|%.2@", plist::Value("abc"), plist::Value(12), "abc", "abc"),
+            "   abc|12    |abc|ab");
+  EXPECT_EQ(format("%12@|%-12.4@|", plist::Array{1, 2}, plist::Array{1, 2}),
+            "      [1, 2]|[1,         |");
+  EXPECT_EQ(format("%@ %.2@ %8@ %.2s %-8s|", null, null, plist::Dictionary(), nullText, nullText),
+            "(null) (null)   (null) (null) (null)  |");
+  EXPECT_EQ(format("%f %+5.1F %05g", negativeNan, negativeNan, negativeNan), "nan  +NAN   nan");
+  EXPECT_EQ(format("%s%c%s", std::string_view("a\0b", 3), '\0', std::string("c")),
+            std::string("a\0b\0c", 5));
+  EXPECT_EQ(format("%s %@ %@ %@", plist::String("s"), plist::Data(asBytes("\x01\xff")),
+                   plist::Date::since1970(0), plist::Number(7)),
+            "s <01ff> 1970-01-01 00:00:00 +0000 7");
+  EXPECT_EQ(format("%u %d %x %hhu %.1f", std::uint8_t{255}, std::int8_t{-1}, std::int16_t{-1}, true,
+                   0.25F),
+            "255 -1 ffffffff 1 0.2");
+  EXPECT_EQ(format("100%%"), "100%");
+  EXPECT_EQ(format(""), "");
+}
+
+TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
+  struct Case {
+    std::string format;
+    std::vector<FormatArgument> arguments;
+    const char* message;
+  };
+  const std::string longAnnotation = "%{" + std::string(60, 'a') + "}s";
+  const Case cases[] = {
+      {"n=%n", {1}, R"("%n" at byte 2 of the format: its last character is no conversion)"},
+      {"%d %", {1}, R"("%" at byte 3 of the format: the format ends within it)"},
+      {"%-08.3l", {1}, R"("%-08.3l" at byte 0 of the format: the format ends within it)"},
+      {"%{public@", {1}, R"("%{public@" at byte 0 of the format: the format ends within it)"},
+      {"%1$d", {1}, R"("%1$" at byte 0 of the format: its last character is no conversion)"},
+      {"%.-5d", {1}, R"("%.-" at byte 0 of the format: its last character is no conversion)"},
+      {"%llld", {1L}, R"("%lll" at byte 0 of the format: its last character is no conversion)"},
+      {"%Lf", {1.0}, R"("%L" at byte 0 of the format: its last character is no conversion)"},
+      {std::string("%\0d", 3),
+       {1},
+       R"("%\u0000" at byte 0 of the format: its last character is no conversion)"},
+      {"%4097d",
+       {1},
+       R"("%4097" at byte 0 of the format: its width or precision is more than 4096)"},
+      {"%.99999999999999999999d",
+       {1},
+       R"("%.9999" at byte 0 of the format: its width or precision is more than 4096)"},
+      {"%*d",
+       {4097, 1},
+       R"("%*d" at byte 0 of the format: its width or precision is 4097, more than 4096)"},
+      {"%*d",
+       {INT_MIN, 1},
+       R"("%*d" at byte 0 of the format: its width or precision is 2147483648, more than 4096)"},
+      {"%.*s",
+       {4097, "x"},
+       R"("%.*s" at byte 0 of the format: its width or precision is 4097, more than 4096)"},
+      {"%*d",
+       {1L, 1},
+       R"("%*d" at byte 0 of the format: it takes a 32-bit integer, but its argument is a 64-bit integer)"},
+      {"%u %s",
+       {1, 2},
+       R"("%s" at byte 3 of the format: it takes a text, but its argument is a 32-bit integer)"},
+      {"%d",
+       {"x"},
+       R"("%d" at byte 0 of the format: it takes a 32-bit integer, but its argument is a text)"},
+      {"%f",
+       {1},
+       R"("%f" at byte 0 of the format: it takes a double, but its argument is a 32-bit integer)"},
+      {"%ld",
+       {1.0},
+       R"("%ld" at byte 0 of the format: it takes a 64-bit integer, but its argument is a double)"},
+      {"%@",
+       {1},
+       R"("%@" at byte 0 of the format: it takes a text, but its argument is a 32-bit integer)"},
+      {"%ls", {"x"}, R"("%ls" at byte 0 of the format: 's' takes no length)"},
+      {"%u/%u", {1U}, R"("%u" at byte 3 of the format: no argument is left for it)"},
+      {"%*d", {1}, R"("%*d" at byte 0 of the format: no argument is left for it)"},
+      {longAnnotation,
+       {1},
+       R"("%{aaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaaa" at byte 0 of the format: it takes a text, but its argument is a 32-bit integer)"},
+      {"%u%%", {1, 2, 3}, "the format uses 1 of its 3 arguments"},
+  };
+  for (const Case& wrong : cases) {
+    std::string out = "before ";
+    const Status status = appendForeignFormat(out, wrong.format, wrong.arguments);
+    EXPECT_EQ(out, "before ") << wrong.format;
+    ASSERT_FALSE(status) << wrong.format;
+    EXPECT_EQ(status.error().message, wrong.message);
+  }
+}
+
+// What keeps a wrong literal from being compiled.
+constexpr FormatFault faultWith(std::string_view text, std::initializer_list<ArgumentType> types) {
+  return checkFormat(text, {types.begin(), types.size()});
+}
+static_assert(faultWith("%d %5.*s%%", {ArgumentType::Int, ArgumentType::Int, ArgumentType::Text}) ==
+              FormatFault::None);
+static_assert(faultWith("%", {}) == FormatFault::NotAConversion);
+static_assert(faultWith("%d%n", {ArgumentType::Int}) == FormatFault::NotAConversion);
+static_assert(faultWith("%d", {ArgumentType::Long}) == FormatFault::WrongArgument);
+static_assert(faultWith("%*d", {ArgumentType::Long, ArgumentType::Int}) ==
+              FormatFault::WrongArgument);
+static_assert(faultWith("%s%s", {ArgumentType::Text}) == FormatFault::MissingArgument);
+static_assert(faultWith("%%", {ArgumentType::Int}) == FormatFault::UnusedArgument);
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,216 @@
+#include "base/plist.h"
+
+#include <cmath>
+#include <gtest/gtest.h>
+#include <limits>
+#include <map>
+#include <random>
+#include <string>
+#include <vector>
+
+namespace tavrel::plist {
+namespace {
+
+constexpr double kTwoTo53 = 9007199254740992.0;
+constexpr double kTwoTo63 = 9223372036854775808.0;
+
+std::vector<std::string> keysOf(const Dictionary& dictionary) {
+  std::vector<std::string> keys;
+  for (const Entry& entry : dictionary)
+    keys.emplace_back(entry.key.view());
+  return keys;
+}
+
+TEST(Number, ComparesByValueWhateverTheKind) {
+  struct Case {
+    Number a;
+    Number b;
+    bool equal;
+  };
+  const Case cases[] = {
+      {std::int8_t{-1}, -1L, true},
+      {1, 1.0F, true},
+      {0, -0.0, true},
+      {0.1F, 0.1, false},
+      {NAN, std::numeric_limits<float>::quiet_NaN(), true},
+      {NAN, 0, false},
+      {(1L << 53) + 1, kTwoTo53, false},
+      {1L << 53, kTwoTo53, true},
+      {-1L, ~0UL, false},
+      {~0UL, ~0UL, true},
+      {7UL, 7, true},
+      {1UL << 63, kTwoTo63, true},
+      {~0UL, 2 * kTwoTo63, false},
+      {std::numeric_limits<std::int64_t>::min(), -kTwoTo63, true},
+      {std::numeric_limits<std::int64_t>::min(), 1UL << 63, false},
+      {std::numeric_limits<std::int64_t>::max(), kTwoTo63, false},
+      {~0UL, -1.0, false},
+      {1, 1.5, false},
+      {std::numeric_limits<std::int64_t>::max(), INFINITY, false},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(c.a == c.b, c.equal) << c.a.real() << " " << c.b.real();
+    EXPECT_EQ(c.b == c.a, c.equal) << c.a.real() << " " << c.b.real();
+  }
+}
+
+TEST(Number, ConvertsWithoutUndefinedResults) {
+  EXPECT_EQ(Number(1e300).int64(), std::numeric_limits<std::int64_t>::max());
+  EXPECT_EQ(Number(-INFINITY).int64(), std::numeric_limits<std::int64_t>::min());
+  EXPECT_EQ(Number(-kTwoTo63).int64(), std::numeric_limits<std::int64_t>::min());
+  EXPECT_EQ(Number(NAN).int64(), 0);
+  EXPECT_EQ(Number(-2.9).int64(), -2);
+  EXPECT_EQ(Number(~0UL).int64(), -1);
+  EXPECT_EQ(Number(~0UL).real(), 2 * kTwoTo63);
+  EXPECT_EQ(Number(0x1'8000'0001L).int32(), std::numeric_limits<std::int32_t>::min() + 1);
+  EXPECT_EQ(Number(-1).uint32(), 0xFFFFFFFF);
+  const NumberKind kinds[] = {Number(std::int8_t{}).kind(),  Number(std::uint8_t{}).kind(),
+                              Number(std::int16_t{}).kind(), Number(std::uint16_t{}).kind(),
+                              Number(std::int32_t{}).kind(), Number(std::uint32_t{}).kind(),
+                              Number(std::int64_t{}).kind(), Number(std::uint64_t{}).kind(),
+                              Number(float{}).kind(),        Number(double{}).kind()};
+  using enum NumberKind;
+  const NumberKind expected[] = {Int8,  Int32, Int32,  Int32, Int32,
+                                 Int64, Int64, UInt64, Float, Double};
+  EXPECT_TRUE(std::ranges::equal(kinds, expected));
+}
+
+TEST(Value, CopiesShareAndCopyingIsExplicit) {
+  Dictionary inner{{"n", 1}};
+  Dictionary outer{{"inner", inner}, {"bytes", Data(asBytes("ab"))}, {"list", Array{inner}}};
+  const Dictionary shallow = mutableCopy(outer);
+  const Dictionary deep = deepCopy(outer).dictionary();
+  EXPECT_FALSE(shallow.isSame(outer));
+  EXPECT_TRUE(shallow.dictionary("inner").isSame(inner));
+  EXPECT_EQ(Value(deep), Value(outer));
+
+  inner.set("n", 2);
+  outer.data("bytes").bytes()[0] = std::byte{'x'};
+  outer.set("new", 1);
+  EXPECT_EQ(outer.array("list").at(0).dictionary().number("n"), Number(2));
+  EXPECT_EQ(shallow.dictionary("inner").number("n"), Number(2));
+  EXPECT_EQ(asText(shallow.data("bytes").bytes()), "xb");
+  EXPECT_FALSE(shallow.contains("new"));
+  EXPECT_EQ(deep.dictionary("inner").number("n"), Number(1));
+  EXPECT_EQ(deep.array("list").at(0).dictionary().number("n"), Number(1));
+  EXPECT_EQ(asText(deep.data("bytes").bytes()), "ab");
+
+  const Array array{1, "two"};
+  const Array arrayCopy = mutableCopy(array);
+  EXPECT_EQ(Value(arrayCopy), Value(array));
+  EXPECT_FALSE(arrayCopy.isSame(array));
+}
+
+TEST(Value, EqualityLooksAtKindAndContent) {
+  const Value values[] = {{},
+                          true,
+                          false,
+                          1,
+                          0,
+                          "",
+                          "1",
+                          Date::sinceEpoch(1),
+                          Date::sinceEpoch(0),
+                          Data(asBytes("1")),
+                          Data(ByteSpan()),
+                          Array{1},
+                          Array::create(),
+                          Dictionary{{"1", 1}},
+                          Dictionary{{"1", 2}},
+                          Dictionary::create()};
+  for (std::size_t i = 0; i < std::size(values); ++i) {
+    for (std::size_t j = 0; j < std::size(values); ++j)
+      EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
+  }
+  EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"b", 2.0}, {"a", 1L}}));
+  EXPECT_NE(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"a", 1}, {"c", 2}}));
+  EXPECT_EQ(Value(Date::sinceEpoch(NAN)), Value(Date::sinceEpoch(NAN)));
+  EXPECT_NE(Value(std::string_view("a\0b", 3)), Value("a"));
+}
+
+TEST(Value, AbsentAndMistypedLookUpsYieldNothing) {
+  const Dictionary empty;
+  EXPECT_FALSE(empty);
+  EXPECT_FALSE(empty.dictionary("a").array("b").at(3).dictionary().number("c"));
+  EXPECT_TRUE(empty.begin() == empty.end());
+  const Dictionary one{{"text", "t"}, {"yes", true}};
+  EXPECT_FALSE(one.number("text") || one.boolean("text") || one.date("text") || one.data("text") ||
+               one.array("text") || one.dictionary("text") || one.string("yes"));
+  EXPECT_FALSE(one.number("yes"));
+  EXPECT_FALSE(Value(1).boolean());
+  EXPECT_EQ(one.string("text"), "t");
+  EXPECT_TRUE(one.get("none").isNull());
+  for (const Value& nothing : {Value(Dictionary()), Value(Array()), Value(Data())})
+    EXPECT_TRUE(nothing.isNull());
+  EXPECT_EQ(Value("").string(), "");
+  EXPECT_EQ(Data().size(), 0U);
+}
+
+TEST(Value, WritingThroughAnEmptyHandleGivesItAContainer) {
+  Dictionary dictionary;
+  const Dictionary stillEmpty = dictionary;
+  dictionary.set("a", 1);
+  const Dictionary shared = dictionary;
+  dictionary.set("b", 2);
+  EXPECT_EQ(shared.size(), 2U);
+  EXPECT_FALSE(stillEmpty);
+  Array array;
+  array.append(1);
+  array.append("two");
+  array.set(1, 2);
+  array.set(9, "beyond");
+  array.remove(9);
+  EXPECT_EQ(Value(array), Value(Array{1, 2}));
+  array.remove(0);
+  EXPECT_EQ(Value(array), Value(Array{2}));
+  EXPECT_TRUE(array.at(1).isNull());
+}
+
+TEST(Value, AssignmentOfItselfAndOfItsOwnPartIsSafe) {
+  Value value = Dictionary{{"part", Array{"text"}}};
+  Value& same = value;
+  value = same;
+  value = value.dictionary().get("part");
+  EXPECT_EQ(value, Value(Array{"text"}));
+  Dictionary names{{"key", "a name that stands only in this dictionary"}};
+  names.set(*names.string("key"), 1);
+  EXPECT_EQ(keysOf(names)[1], "a name that stands only in this dictionary");
+  EXPECT_TRUE(names.remove(*names.string("key")));
+  names.set(names.begin()->key, Value());
+  EXPECT_TRUE(names.empty());
+}
+
+// The index begins beyond eight entries: random changes are compared with a plain list of keys.
+TEST(Dictionary, KeepsOrderAndContentThroughManyChanges) {
+  std::mt19937 random(7);
+  for (const unsigned keyCount : {4U, 9U, 20U, 500U}) {
+    Dictionary dictionary;
+    std::vector<std::string> order;
+    std::map<std::string, int> content;
+    for (int step = 0; step < 4000; ++step) {
+      const std::string key = "key" + std::to_string(random() % keyCount);
+      if (random() % 5 < 2) {
+        EXPECT_EQ(dictionary.remove(key), content.erase(key) == 1);
+        std::erase(order, key);
+      } else {
+        if (random() % 2 == 0) {
+          dictionary.set(key, step);
+        } else {
+          dictionary.set(String(key), step);
+        }
+        if (content.insert_or_assign(key, step).second) order.push_back(key);
+      }
+      ASSERT_EQ(dictionary.size(), content.size());
+      if (step % 50 == 0) {
+        ASSERT_EQ(keysOf(dictionary), order);
+        for (unsigned i = 0; i < keyCount; ++i) {
+          const std::string name = "key" + std::to_string(i);
+          ASSERT_EQ(dictionary.get(name), content.contains(name) ? Value(content[name]) : Value());
+        }
+      }
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tavrel::plist

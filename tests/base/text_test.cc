@@ -1,0 +1,184 @@
+#include "base/text.h"
+
+#include <cfloat>
+#include <cmath>
+#include <cstdlib>
+#include <gtest/gtest.h>
+#include <limits>
+#include <random>
+#include <string>
+
+#include "base/civil_time.h"
+#include "base/utf8.h"
+
+namespace tavrel {
+namespace {
+
+TEST(Text, WritesNumbersSoThatTheyReadBack) {
+  struct Case {
+    plist::Number number;
+    const char* text;
+  };
+  const Case cases[] = {
+      {0.1, "0.1"},
+      {1.0 / 3, "0.3333333333333333"},
+      {100000.0, "100000"},
+      {-1e15, "-1000000000000000"},
+      {9007199254740992.0, "9007199254740992"},
+      {1e22, "1e+22"},
+      {1e-5, "1e-05"},
+      {-0.0, "-0"},
+      {0.0, "0"},
+      {DBL_MAX, "1.7976931348623157e+308"},
+      {4.9e-324, "5e-324"},
+      {INFINITY, "inf"},
+      {-INFINITY, "-inf"},
+      {std::copysign(NAN, -1.0), "nan"},
+      {0.5F, "0.5"},
+      {std::int8_t{-128}, "-128"},
+      {std::numeric_limits<std::int64_t>::min(), "-9223372036854775808"},
+      {~0UL, "18446744073709551615"},
+  };
+  for (const Case& c : cases)
+    EXPECT_EQ(numberText(c.number), c.text);
+  std::mt19937_64 random(3);
+  for (int i = 0; i < 10000; ++i) {
+    const double value = std::bit_cast<double>(random());
+    EXPECT_EQ(plist::Number(std::strtod(numberText(value).c_str(), nullptr)), plist::Number(value));
+  }
+}
+
+TEST(Text, WritesObjectsAsPeopleReadThem) {
+  const auto moment = plist::Date::since1970(1794852138.75);
+  const plist::Dictionary all{{"none", plist::Array::create()},
+                              {"text", "a\"b\\c\n\r\t\x01\x7f\xc3\xa4\xff"},
+                              {"yes", true},
+                              {"no", false},
+                              {"when", moment},
+                              {"bytes", plist::Data(asBytes("\x0a\xf0"))},
+                              {"empty", plist::Dictionary::create()},
+                              {"nan", NAN}};
+  EXPECT_EQ(textOf(all), R"({"none": [], "text": "a\"b\\c\n\r\t\u0001\u007f)"
+                         "\xc3\xa4\xef\xbf\xbd"
+                         R"(", "yes": 1, "no": 0, "when": "2026-11-16 18:02:18 +0000", )"
+                         R"("bytes": "<0af0>", "empty": {}, "nan": nan})");
+  EXPECT_EQ(textOf("plain \"text\"\n"), "plain \"text\"\n");
+  EXPECT_EQ(textOf(true), "1");
+  EXPECT_EQ(textOf(moment), "2026-11-16 18:02:18 +0000");
+  EXPECT_EQ(textOf(plist::Data(ByteSpan())), "<>");
+  EXPECT_EQ(textOf({}), "(null)");
+}
+
+TEST(Text, WritesEveryDate) {
+  EXPECT_EQ(dateText(plist::Date::since1970(-0.5)), "1969-12-31 23:59:59 +0000");
+  EXPECT_EQ(dateText(plist::Date::ofDay(-719529)), "-0001-12-31 00:00:00 +0000");
+  EXPECT_EQ(dateText(plist::Date::sinceEpoch(0)), "2001-01-01 00:00:00 +0000");
+  EXPECT_EQ(dateText(plist::Date::since1970(1e300)), "@1e+300");
+  EXPECT_EQ(dateText(plist::Date::since1970(-INFINITY)), "@-inf");
+  EXPECT_EQ(dateText(plist::Date::since1970(NAN)), "@nan");
+}
+
+TEST(CivilTime, EveryDayOf32BitsHasADate) {
+  struct Case {
+    std::int64_t day;
+    CivilDate date;
+    const char* text;
+  };
+  const Case cases[] = {
+      {0, {1970, 1, 1}, "1970-01-01"},
+      {-1, {1969, 12, 31}, "1969-12-31"},
+      {11016, {2000, 2, 29}, "2000-02-29"},
+      {-25509, {1900, 2, 28}, "1900-02-28"},
+      {-25508, {1900, 3, 1}, "1900-03-01"},
+      {-719468, {0, 3, 1}, "0000-03-01"},
+      {-719529, {-1, 12, 31}, "-0001-12-31"},
+      {2932896, {9999, 12, 31}, "9999-12-31"},
+      {2932897, {10000, 1, 1}, "10000-01-01"},
+      {INT32_MAX, {5881580, 7, 11}, "5881580-07-11"},
+      {INT32_MIN, {-5877641, 6, 23}, "-5877641-06-23"},
+  };
+  for (const Case& c : cases) {
+    EXPECT_EQ(civilFromDays(c.day), c.date) << c.text;
+    EXPECT_EQ(daysFromCivil(c.date), c.day) << c.text;
+    EXPECT_EQ(dateText(c.date), c.text);
+    EXPECT_EQ(parseDate(c.text), c.date);
+  }
+  CivilDate before = civilFromDays(INT32_MIN - std::int64_t{1});
+  for (std::int64_t day = INT32_MIN; day <= INT32_MAX; day += day % 97 == 0 ? 1 : 49999) {
+    const CivilDate date = civilFromDays(day);
+    ASSERT_TRUE(isValid(date)) << day;
+    ASSERT_EQ(daysFromCivil(date), day);
+    ASSERT_GE(date.year, before.year);
+    before = date;
+  }
+}
+
+TEST(CivilTime, EveryInstantOf64BitsHasFields) {
+  for (const std::int64_t seconds : {INT64_MIN, INT64_MIN + 86400, std::int64_t{-86401},
+                                     std::int64_t{-1}, std::int64_t{86399}, INT64_MAX}) {
+    const CivilTime time = civilFromSeconds(seconds);
+    EXPECT_TRUE(time.hour < 24 && time.minute < 60 && time.second < 60) << seconds;
+    EXPECT_EQ(secondsFromCivil(time), seconds);
+  }
+  EXPECT_EQ(civilFromSeconds(-1), (CivilTime{{1969, 12, 31}, 23, 59, 59}));
+}
+
+TEST(CivilTime, ReadsOnlyWhatItWrites) {
+  for (const char* text : {"",
+                           "2026",
+                           "2026-2-03",
+                           "2026-02-3",
+                           "2026-02-30",
+                           "1900-02-29",
+                           "2026-13-01",
+                           "2026-00-10",
+                           "2026-01-00",
+                           "2026-01-0a",
+                           "2026-01-+1",
+                           "2026-01--1",
+                           " 2026-01-01",
+                           "+2026-01-01",
+                           "2026-01-01 ",
+                           "2026/01/01",
+                           "02026-01-01",
+                           "-0000-01-01",
+                           "--001-01-01",
+                           "1000000001-01-01",
+                           "99999999999-01-01"}) {
+    EXPECT_FALSE(parseDate(text)) << text;
+  }
+}
+
+TEST(Utf8, TellsWellFormedFromMalformed) {
+  struct Case {
+    std::string_view text;
+    std::string_view repaired;
+  };
+  const Case malformed[] = {
+      {"a\x80z", "a\uFFFDz"},
+      {"\xC0\xAF", "\uFFFD\uFFFD"},                      // over-long
+      {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // over-long
+      {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
+      {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // beyond U+10FFFF
+      {"\xF8\x88\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},
+      {"\xE2\x82", "\uFFFD\uFFFD"},  // cut
+      {"\xE2\x82z", "\uFFFD\uFFFDz"},
+      {"\xFF", "\uFFFD"},
+  };
+  for (const Case& c : malformed) {
+    EXPECT_FALSE(isValidUtf8(c.text)) << c.repaired;
+    EXPECT_EQ(repairedUtf8(c.text), c.repaired);
+  }
+  for (char32_t codePoint = 0; codePoint <= 0x110000; ++codePoint) {
+    const bool exists = codePoint <= 0x10FFFF && (codePoint < 0xD800 || codePoint > 0xDFFF);
+    std::string text;
+    appendCodePoint(text, codePoint);
+    ASSERT_TRUE(isValidUtf8(text)) << std::hex << static_cast<unsigned>(codePoint);
+    std::string_view rest = text;
+    ASSERT_EQ(takeCodePoint(rest), exists ? codePoint : kReplacementCharacter);
+    ASSERT_TRUE(rest.empty());
+  }
+}
+
+}  // namespace
+}  // namespace tavrel
