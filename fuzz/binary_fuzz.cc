@@ -1,0 +1,28 @@
+// Reads hostile binary property lists. What is read must survive the binary encoding unchanged;
+// XML cannot hold all of it, so there the second writing must give the bytes of the first.
+#include <cstdint>
+#include <cstdlib>
+
+#include "platform/plist/binary.h"
+#include "platform/plist/xml.h"
+
+using namespace tavrel;
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  const auto value = plist::readBinary(std::as_bytes(std::span(data, size)));
+  if (!value) return 0;
+
+  const auto binary = plist::writeBinary(*value);
+  // What is shared is written once for each place that it is in, and may be too much then.
+  if (!binary) return 0;
+  const auto fromBinary = plist::readBinary(asBytes(*binary));
+  if (!fromBinary || *fromBinary != *value) std::abort();
+
+  const auto xml = plist::writeXml(*value);
+  if (!xml) return 0;
+  const auto fromXml = plist::readXml(asBytes(*xml));
+  if (!fromXml) std::abort();
+  const auto again = plist::writeXml(*fromXml);
+  if (!again || *again != *xml) std::abort();
+  return 0;
+}

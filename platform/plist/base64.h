@@ -1,0 +1,18 @@
+// Base64, as the XML encoding of property lists writes data.
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/bytes.h"
+
+namespace tavrel::plist {
+
+void appendBase64(std::string& out, ByteSpan bytes);
+
+/// Reads base64 with white space anywhere in it into `out`, whose content is replaced. False for
+/// any other character, and for a text that does not end as its padding says.
+bool readBase64(std::string_view text, std::vector<std::byte>& out);
+
+}  // namespace tavrel::plist

@@ -1,0 +1,23 @@
+// Property-list coding as the platform offers it, and reading of either encoding.
+#pragma once
+
+#include <string>
+
+#include "base/bytes.h"
+#include "base/expected.h"
+#include "base/plist.h"
+#include "platform/property_list_coding.h"
+
+namespace tavrel::plist {
+
+/// Reads an XML or a binary document, recognised by content.
+Expected<Value> read(ByteSpan bytes);
+
+/// Without state of its own: one may serve all.
+class PlistCoding final : public PropertyListCoding {
+ public:
+  Expected<std::string> encodeXml(const Value& value) override;
+  Expected<Value> decode(ByteSpan bytes) override;
+};
+
+}  // namespace tavrel::plist

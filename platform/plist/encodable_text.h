@@ -1,0 +1,29 @@
+// Text as an encoding, or the message of an error, can hold it.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace tavrel::plist {
+
+enum class Alphabet : std::uint8_t {
+  Unicode,  // every well-formed text
+  Xml       // without the control characters and U+FFFE, U+FFFF that XML 1.0 forbids
+};
+
+/// True when the alphabet has all of the text.
+bool isEncodable(std::string_view text, Alphabet alphabet);
+
+/// The text with U+FFFD for each malformed byte and each character that the alphabet lacks.
+std::string encodable(std::string_view text, Alphabet alphabet);
+
+/// Appends what `encodable` gives for the alphabet Xml, with markup characters escaped. A carriage
+/// return is escaped too: parsers turn a plain one into a line feed.
+void appendXmlText(std::string& out, std::string_view text);
+
+/// The start of a text for a message: on one line, escaped as JSON does, and cut with "..." behind
+/// 60 bytes.
+std::string excerpt(std::string_view text);
+
+}  // namespace tavrel::plist

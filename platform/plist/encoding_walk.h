@@ -1,0 +1,67 @@
+// What the two encoders share: which values are refused, and the order of keys.
+#pragma once
+
+#include <cstddef>
+#include <deque>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/expected.h"
+#include "base/plist.h"
+#include "platform/plist/encodable_text.h"
+
+namespace tavrel::plist {
+
+/// Admits the values of one document and remembers why it did not. Operations answer false for a
+/// failure, so that a walk can return what they answer.
+class EncodingGuard {
+ public:
+  /// `depth` is the number of containers around the value.
+  bool admit(const Value& value, std::size_t depth);
+  bool admitBytes(std::size_t documentBytes);
+
+  /// Fails because of the value at hand.
+  bool fail(std::string reason);
+
+  /// Notes, on the way back from a failure, through which key or index the value was reached.
+  bool under(std::string_view step);
+  bool under(std::size_t index) { return under(std::to_string(index)); }
+
+  Error error() const;
+
+ private:
+  std::size_t values_ = 0;
+  std::string reason_;
+  std::string path_;
+  bool hasPath_ = false;
+};
+
+/// The entries of dictionaries in the order of their keys, as the alphabet holds them. It works as
+/// a stack, since dictionaries nest: entries stay until they are popped. Entries borrow from the
+/// dictionary.
+class SortedEntries {
+ public:
+  struct Item {
+    std::string_view key;
+    const Value* value;
+  };
+
+  explicit SortedEntries(Alphabet alphabet) : alphabet_(alphabet) {}
+
+  /// Puts the entries on top and yields the index of the first.
+  std::size_t push(const Dictionary& dictionary);
+  void popTo(std::size_t first) { items_.resize(first); }
+
+  std::size_t end() const { return items_.size(); }
+  const Item& operator[](std::size_t index) const { return items_[index]; }
+
+ private:
+  void repairKeys(std::size_t first);
+
+  Alphabet alphabet_;
+  std::vector<Item> items_;
+  std::deque<std::string> repaired_;  // keys that stand in no dictionary
+};
+
+}  // namespace tavrel::plist

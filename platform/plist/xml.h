@@ -1,0 +1,34 @@
+// The XML encoding of property lists.
+//
+// Written: UTF-8, no document-type line, tabs, keys in the order of their bytes, so that equal
+// values give equal bytes (numbers are equal here when they are of the same sort and value). Read:
+// every encoding that Expat knows, with or without a document-type line; no entity is declared or
+// expanded, and nothing is fetched.
+//
+//   const auto document = plist::readXml(bytes);
+//   if (!document) log(document.error().message);  // "XML property list, line 3, column 7: ..."
+//
+// What is written reads back equal, but for what XML cannot hold:
+//   - control characters (other than tab, line feed and carriage return), U+FFFE, U+FFFF and
+//     malformed UTF-8 become U+FFFD. Keys that become equal by that are told apart by a number
+//     behind the later ones: "a\x01", "a\x02" are written as "a\uFFFD", "a\uFFFD2";
+//   - a date loses its fraction of a second (it is rounded down);
+//   - a float is read as the double of the same value, an integer as a 64-bit one.
+#pragma once
+
+#include <string>
+
+#include "base/bytes.h"
+#include "base/expected.h"
+#include "base/plist.h"
+
+namespace tavrel::plist {
+
+/// Fails for a value that is or contains null, a date that no calendar reaches (not a number, or
+/// more than 10^9 years off), and for what the limits of base/limits.h would not let back in.
+Expected<std::string> writeXml(const Value& value);
+
+/// The value is the caller's own. Of two equal keys in one dictionary the later wins.
+Expected<Value> readXml(ByteSpan bytes);
+
+}  // namespace tavrel::plist

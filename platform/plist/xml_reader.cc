@@ -1,0 +1,298 @@
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <expat.h>
+#include <memory>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/plist/base64.h"
+#include "platform/plist/encodable_text.h"
+#include "platform/plist/scalar_text.h"
+#include "platform/plist/xml.h"
+
+namespace tavrel::plist {
+namespace {
+
+constexpr std::string_view kSpace = " \t\r\n";
+
+// Those from Key to Data hold text.
+enum class Element : std::uint8_t {
+  None,
+  Plist,
+  Dict,
+  Array,
+  Key,
+  String,
+  Integer,
+  Real,
+  Date,
+  Data,
+  True,
+  False
+};
+
+constexpr std::array<std::pair<std::string_view, Element>, 11> kElements{{
+    {"plist", Element::Plist},
+    {"dict", Element::Dict},
+    {"array", Element::Array},
+    {"key", Element::Key},
+    {"string", Element::String},
+    {"integer", Element::Integer},
+    {"real", Element::Real},
+    {"date", Element::Date},
+    {"data", Element::Data},
+    {"true", Element::True},
+    {"false", Element::False},
+}};
+
+Element elementNamed(std::string_view name) {
+  for (const auto& [elementName, element] : kElements) {
+    if (elementName == name) return element;
+  }
+  return Element::None;
+}
+
+std::string_view trimmed(std::string_view text) {
+  const std::size_t first = text.find_first_not_of(kSpace);
+  if (first == std::string_view::npos) return {};
+  return text.substr(first, text.find_last_not_of(kSpace) - first + 1);
+}
+
+// Turns Expat's events into values as they come. What a container holds is gathered on one stack,
+// so that a container is made once, with room for just its elements.
+class XmlReader {
+ public:
+  Expected<Value> read(ByteSpan bytes);
+
+  void startElement(std::string_view name);
+  void endElement();
+  void characters(std::string_view text);
+  /// The first failure counts; it ends the parse.
+  void fail(std::string_view reason);
+
+ private:
+  struct Container {
+    Element element;
+    bool hasKey = false;     // a key waits for its value on top of the stack
+    std::size_t firstEntry;  // in `entries_`
+  };
+
+  std::string located(std::string_view reason) const;
+  void startValue(Element element, std::string_view name);
+  void endScalar();
+  void endContainer();
+  void add(Value value);
+
+  struct ParserDeleter {
+    void operator()(XML_Parser parser) const { XML_ParserFree(parser); }
+  };
+  std::unique_ptr<std::remove_pointer_t<XML_Parser>, ParserDeleter> parser_;
+
+  bool failed_ = false;
+  std::string error_;
+
+  bool insidePlist_ = false;
+  Element scalar_ = Element::None;  // the element whose text is being gathered
+  std::string text_;
+  std::vector<std::byte> data_;
+  std::vector<Container> containers_;
+  std::vector<Entry> entries_;  // the elements of arrays have empty keys
+  std::size_t values_ = 0;
+  Value root_;
+};
+
+// Nothing may be thrown through the parser, which is C: without memory the process ends here.
+void XMLCALL onStart(void* reader, const XML_Char* name, const XML_Char** /*attributes*/) noexcept {
+  static_cast<XmlReader*>(reader)->startElement(name);
+}
+void XMLCALL onEnd(void* reader, const XML_Char* /*name*/) noexcept {
+  static_cast<XmlReader*>(reader)->endElement();
+}
+void XMLCALL onCharacters(void* reader, const XML_Char* text, int length) noexcept {
+  static_cast<XmlReader*>(reader)->characters({text, static_cast<std::size_t>(length)});
+}
+void XMLCALL onEntity(void* reader, const XML_Char* name, int, const XML_Char*, int,
+                      const XML_Char*, const XML_Char*, const XML_Char*, const XML_Char*) noexcept {
+  static_cast<XmlReader*>(reader)->fail("entity \"" + excerpt(name) +
+                                        "\" is declared; a property list may declare none");
+}
+void XMLCALL onSkippedEntity(void* reader, const XML_Char* name, int) noexcept {
+  static_cast<XmlReader*>(reader)->fail("entity \"" + excerpt(name) + "\" is not known");
+}
+
+Expected<Value> XmlReader::read(ByteSpan bytes) {
+  if (bytes.size() > limits::kPropertyListBytes) {
+    return Error{format("XML property list: %zu bytes are more than the %zu that are read",
+                        bytes.size(), limits::kPropertyListBytes)};
+  }
+  parser_.reset(XML_ParserCreate(nullptr));
+  if (!parser_) return Error{"XML property list: no memory for the parser"};
+  XML_SetUserData(parser_.get(), this);
+  XML_SetElementHandler(parser_.get(), onStart, onEnd);
+  XML_SetCharacterDataHandler(parser_.get(), onCharacters);
+  XML_SetEntityDeclHandler(parser_.get(), onEntity);
+  XML_SetSkippedEntityHandler(parser_.get(), onSkippedEntity);
+
+  const XML_Status status = XML_Parse(parser_.get(), reinterpret_cast<const char*>(bytes.data()),
+                                      static_cast<int>(bytes.size()), XML_TRUE);
+  if (failed_) return Error{std::move(error_)};
+  if (status != XML_STATUS_OK) {
+    return Error{located(XML_ErrorString(XML_GetErrorCode(parser_.get())))};
+  }
+  return std::move(root_);
+}
+
+std::string XmlReader::located(std::string_view reason) const {
+  return format("XML property list, line %zu, column %zu: %s",
+                std::size_t{XML_GetCurrentLineNumber(parser_.get())},
+                std::size_t{XML_GetCurrentColumnNumber(parser_.get())} + 1, reason);
+}
+
+void XmlReader::fail(std::string_view reason) {
+  if (failed_) return;
+  failed_ = true;
+  error_ = located(reason);
+  XML_StopParser(parser_.get(), XML_FALSE);
+}
+
+void XmlReader::startElement(std::string_view name) {
+  if (failed_) return;
+  const Element element = elementNamed(name);
+  if (scalar_ != Element::None) {
+    return fail("<" + excerpt(name) + "> stands where only text may");
+  }
+  if (element == Element::None) {
+    return fail("<" + excerpt(name) + "> is no element of property lists");
+  }
+  if ((element == Element::Plist) == insidePlist_) {
+    return fail(insidePlist_ ? "<plist> stands inside <plist>"
+                             : "<" + excerpt(name) + "> stands where <plist> should");
+  }
+  if (element == Element::Plist) {
+    insidePlist_ = true;
+  } else if (element == Element::Key) {
+    if (containers_.empty() || containers_.back().element != Element::Dict) {
+      return fail("<key> stands outside <dict>");
+    }
+    if (containers_.back().hasKey) return fail("<key> stands where the value of a key should");
+    scalar_ = Element::Key;
+    text_.clear();
+  } else {
+    startValue(element, name);
+  }
+}
+
+void XmlReader::startValue(Element element, std::string_view name) {
+  if (containers_.empty()
+          ? !root_.isNull()
+          : containers_.back().element == Element::Dict && !containers_.back().hasKey) {
+    return fail("<" + excerpt(name) +
+                (containers_.empty() ? "> is a second value" : "> stands where <key> should"));
+  }
+  if (++values_ > limits::kPropertyListValues) {
+    return fail(format("there are more than %zu values", limits::kPropertyListValues));
+  }
+  if (element != Element::Dict && element != Element::Array) {
+    scalar_ = element;
+    text_.clear();
+    return;
+  }
+  if (containers_.size() == limits::kPropertyListDepth) {
+    return fail(format("containers nest deeper than %zu", limits::kPropertyListDepth));
+  }
+  containers_.push_back({.element = element, .firstEntry = entries_.size()});
+}
+
+void XmlReader::endElement() {
+  if (failed_) return;
+  if (scalar_ != Element::None) {
+    endScalar();
+  } else if (!containers_.empty()) {
+    endContainer();
+  } else if (root_.isNull()) {
+    fail("<plist> holds no value");
+  }
+}
+
+void XmlReader::endScalar() {
+  switch (std::exchange(scalar_, Element::None)) {
+    case Element::Key:
+      entries_.push_back({text_, Value()});
+      containers_.back().hasKey = true;
+      return;
+    case Element::String:
+      return add(text_);
+    case Element::Integer:
+      if (const auto number = parseInteger(trimmed(text_))) return add(*number);
+      return fail("\"" + excerpt(text_) + "\" is no integer of 64 bits");
+    case Element::Real:
+      if (const auto number = parseReal(trimmed(text_))) return add(*number);
+      return fail("\"" + excerpt(text_) + "\" is no real number that a double holds");
+    case Element::Date:
+      if (const auto date = parseDate(trimmed(text_))) return add(*date);
+      return fail("\"" + excerpt(text_) + "\" is no date of the form YYYY-MM-DDTHH:MM:SSZ");
+    case Element::Data:
+      if (readBase64(text_, data_)) return add(Data(data_));
+      return fail("the text of <data> is not base64");
+    case Element::True:
+      return add(true);
+    default:
+      return add(false);
+  }
+}
+
+void XmlReader::endContainer() {
+  const Container container = containers_.back();
+  if (container.hasKey) return fail("the last <key> of a <dict> has no value");
+  containers_.pop_back();
+  const auto first = entries_.begin() + static_cast<std::ptrdiff_t>(container.firstEntry);
+  const auto count = static_cast<std::size_t>(entries_.end() - first);
+  Value value;
+  if (container.element == Element::Dict) {
+    Dictionary dictionary = Dictionary::create(count);
+    for (auto entry = first; entry != entries_.end(); ++entry)
+      dictionary.set(entry->key, std::move(entry->value));
+    value = dictionary;
+  } else {
+    Array array = Array::create(count);
+    for (auto entry = first; entry != entries_.end(); ++entry)
+      array.append(std::move(entry->value));
+    value = array;
+  }
+  entries_.erase(first, entries_.end());
+  add(std::move(value));
+}
+
+void XmlReader::add(Value value) {
+  if (containers_.empty()) {
+    root_ = std::move(value);
+  } else if (containers_.back().element == Element::Dict) {
+    entries_.back().value = std::move(value);
+    containers_.back().hasKey = false;
+  } else {
+    entries_.push_back({String(), std::move(value)});
+  }
+}
+
+void XmlReader::characters(std::string_view text) {
+  if (failed_) return;
+  if (scalar_ >= Element::Key && scalar_ <= Element::Data) {
+    text_.append(text);
+  } else if (text.find_first_not_of(kSpace) != std::string_view::npos) {
+    fail("text stands outside an element that holds text");
+  }
+}
+
+}  // namespace
+
+Expected<Value> readXml(ByteSpan bytes) {
+  return XmlReader().read(bytes);
+}
+
+}  // namespace tavrel::plist

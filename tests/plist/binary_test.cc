@@ -1,0 +1,243 @@
+#include "platform/plist/binary.h"
+
+#include <cmath>
+#include <gtest/gtest.h>
+#include <limits>
+#include <string>
+#include <vector>
+
+#include "base/limits.h"
+#include "platform/plist/coding.h"
+#include "platform/plist/xml.h"
+
+namespace tavrel::plist {
+namespace {
+
+using namespace std::string_literals;
+
+// A document of objects given as bytes, with references of one byte and offsets of one or two; the
+// first object is the root and stands at offset 8.
+std::string document(const std::vector<std::string>& objects, std::size_t offsetWidth = 1) {
+  std::string out = "bplist00";
+  std::string table;
+  const auto appendOffset = [&](std::string& to) {
+    if (offsetWidth == 2) to += static_cast<char>(out.size() >> 8);
+    to += static_cast<char>(out.size() & 0xFF);
+  };
+  for (const std::string& object : objects) {
+    appendOffset(table);
+    out += object;
+  }
+  std::string trailer = "\0\0\0\0\0\0"s + static_cast<char>(offsetWidth) + '\1';
+  trailer +=
+      "\0\0\0\0\0\0\0"s + static_cast<char>(objects.size()) + std::string(16 - offsetWidth, '\0');
+  appendOffset(trailer);
+  return out + table + trailer;
+}
+
+std::string errorOf(const std::string& bytes) {
+  const auto value = readBinary(asBytes(bytes));
+  return value ? "no error" : value.error().message;
+}
+
+TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
+  const struct {
+    Value value;
+    std::string object;
+  } rows[] = {
+      {true, "\x09"s},
+      {false, "\x08"s},
+      {std::int8_t{7}, "\x10\x07"s},
+      {255, "\x10\xFF"s},
+      {256, "\x11\x01\x00"s},
+      {0xFFFFFFFF, "\x12\xFF\xFF\xFF\xFF"s},
+      {-1, "\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
+      {std::uint64_t{1} << 63, "\x14\0\0\0\0\0\0\0\0\x80\0\0\0\0\0\0\0"s},
+      {1.5F, "\x22\x3F\xC0\0\0"s},
+      {-0.0, "\x23\x80\0\0\0\0\0\0\0"s},
+      {Date::sinceEpoch(0.5), "\x33\x3F\xE0\0\0\0\0\0\0"s},
+      {"", "\x50"s},
+      {"fourteen chars",
+       "\x5E"
+       "fourteen chars"s},
+      {"fifteen letters",
+       "\x5F\x10\x0F"
+       "fifteen letters"s},
+      {"\xC3\xA9\xF0\x9F\x98\x80", "\x63\0\xE9\xD8\x3D\xDE\0"s},
+      {Data(asBytes("\1\2\3")), "\x43\1\2\3"s},
+      {Array::create(), "\xA0"s},
+      {Dictionary::create(), "\xD0"s},
+  };
+  for (const auto& row : rows) {
+    const auto binary = writeBinary(row.value);
+    ASSERT_TRUE(binary) << binary.error().message;
+    EXPECT_EQ(*binary, document({row.object}));
+    const auto value = readBinary(asBytes(*binary));
+    ASSERT_TRUE(value) << value.error().message;
+    EXPECT_EQ(*value, row.value);
+    if (const auto number = row.value.number(); number && number->isFloating()) {
+      EXPECT_EQ(value->number()->kind(), number->kind());
+      EXPECT_EQ(std::signbit(value->number()->real()), std::signbit(number->real()));
+    }
+  }
+}
+
+TEST(Binary, EqualScalarsAreOneObjectAndKeysAreSorted) {
+  const Dictionary value{{"b", Array{1, std::int8_t{1}, "a", 1.0}}, {"a", 1}};
+  EXPECT_EQ(*writeBinary(value), document({"\xD2\1\3\2\4"s,
+                                           "\x51"
+                                           "a"s,
+                                           "\x10\1"s,
+                                           "\x51"
+                                           "b"s,
+                                           "\xA4\2\2\1\5"s, "\x23\x3F\xF0\0\0\0\0\0\0"s}));
+}
+
+TEST(Binary, LargeDocumentsUseWiderReferences) {
+  Dictionary large;
+  for (int i = 0; i < 30'000; ++i)
+    large.set(std::to_string(i), Array{i, std::to_string(i % 10)});
+  const auto value = readBinary(asBytes(*writeBinary(large)));
+  ASSERT_TRUE(value) << value.error().message;
+  EXPECT_EQ(*value, Value(large));
+  EXPECT_EQ(*read(asBytes(*writeXml(*value))), Value(large));
+}
+
+TEST(Binary, SharedContainersBecomeSeparateValues) {
+  const auto value = readBinary(asBytes(document({"\xA2\1\1"s, "\xA1\2"s, "\x41x"s})));
+  ASSERT_TRUE(value) << value.error().message;
+  value->array().at(0).array().at(0).data().bytes()[0] = std::byte{'y'};
+  EXPECT_EQ(*value, Value(Array{Array{Data(asBytes("y"))}, Array{Data(asBytes("x"))}}));
+}
+
+TEST(Binary, TextThatIsNotUnicodeIsRepaired) {
+  EXPECT_EQ(*readBinary(asBytes(document({"\x63\xD8\0\0a\xDC\0"s}))), Value("\uFFFDa\uFFFD"));
+  const Dictionary clash{{"k\xFF", 2}, {"k\xFE", 1}, {"\x01", 0}};
+  EXPECT_EQ(*readBinary(asBytes(*writeBinary(clash))),
+            Value(Dictionary{{"k\uFFFD", 1}, {"k\uFFFD2", 2}, {"\x01", 0}}));
+}
+
+TEST(Binary, RefusesToWriteNullAndCycles) {
+  EXPECT_EQ(writeBinary(Dictionary{{"a", Array{1, Value()}}}).error().message,
+            "cannot encode the property list, value /a/1: null has no encoding");
+  Dictionary cyclic;
+  cyclic.set("self", Dictionary{{"x", 1}});
+  cyclic.dictionary("self").set("self", cyclic);
+  EXPECT_EQ(writeBinary(cyclic).error().message,
+            "cannot encode the property list: containers nest deeper than 128, or one contains "
+            "itself");
+  cyclic.remove("self");
+}
+
+TEST(Binary, HostileObjectsAreRefused) {
+  std::vector<std::string> expanding{"\xAA\1\1\1\1\1\1\1\1\1\1"s};
+  for (char i = 2; i < 9; ++i)
+    expanding.push_back("\xAA"s + std::string(10, i));
+  expanding.push_back("\x09"s);
+  const struct {
+    std::vector<std::string> objects;
+    std::string error;  // behind "offset "
+  } rows[] = {
+      {{"\x00"s}, "8: marker 0x00 is of no type that is read"},
+      {{"\x80\1"s}, "8: marker 0x80 is of no type that is read"},
+      {{"\xC1\1"s}, "8: marker 0xc1 is of no type that is read"},
+      {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of no type that is read"},
+      {{"\x15"s}, "8: an integer of more than 16 bytes"},
+      {{"\x14\0\0\0\0\0\0\0\1\0\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
+      {{"\x14\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\1\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
+      {{"\x21\0\0"s}, "8: a real of neither 4 nor 8 bytes"},
+      {{"\x11\1"s}, "8: the object does not end before the table of offsets"},
+      {{"\x53"
+        "ab"s},
+       "8: the object does not end before the table of offsets"},
+      {{"\x62\0a\0"s}, "8: the object does not end before the table of offsets"},
+      {{"\x4F"s}, "8: the object does not end before the table of offsets"},
+      {{"\x4F\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
+       "8: the object does not end before the table of offsets"},
+      {{"\x4F\x22\0\0\0\1"s}, "9: the length of an object is no integer of 1 to 8 bytes"},
+      {{"\xDF\x13\x80\0\0\0\0\0\0\1"s}, "8: the object does not end before the table of offsets"},
+      {{"\xD1\1"s}, "8: the object does not end before the table of offsets"},
+      {{"\x51\xE9"s}, "8: a byte of a text is not ASCII"},
+      {{"\xA1\1"s}, "9: a reference to object 1, where there are 1"},
+      {{"\xD1\1\1"s, "\x09"s}, "11: a key is no text"},
+      {{"\xA1\0"s}, "8: a container contains itself"},
+      {{"\xA1\1"s, "\xD1\2\0"s, "\x51\x61"s}, "8: a container contains itself"},
+      {expanding, "85: there are more than 1000000 values, after shared references are expanded"},
+  };
+  for (const auto& row : rows) {
+    EXPECT_EQ(errorOf(document(row.objects)), "binary property list, offset " + row.error);
+  }
+
+  std::vector<std::string> nested;
+  for (int i = 1; i < 129; ++i)
+    nested.push_back("\xA1"s + static_cast<char>(i));
+  nested.push_back("\xA0");
+  EXPECT_EQ(errorOf(document(nested, 2)),
+            "binary property list, offset 264: containers nest deeper than 128");
+  nested.back() = "\x09";
+  EXPECT_EQ(errorOf(document(nested, 2)), "no error");
+}
+
+TEST(Binary, HostileTrailersAreRefused) {
+  const std::string good = document({"\x09"s});  // table at 9, trailer at 10
+  ASSERT_EQ(errorOf(good), "no error");
+  const struct {
+    std::size_t at;
+    std::string bytes;
+    std::string error;
+  } rows[] = {
+      {0, "bplist15", "0: it does not begin with \"bplist00\""},
+      {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},
+      {17, "\x09"s, "17: 9 is no width from 1 to 8 bytes"},
+      {16, "\2"s, "18: the table of offsets has no room for 1 objects"},
+      {18, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
+       "18: the table of offsets has no room for 18446744073709551615 objects"},
+      {26, "\0\0\0\0\0\0\0\1"s, "26: a reference to object 1, where there are 1"},
+      {34, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
+       "34: the table of offsets begins at 18446744073709551615, outside the document"},
+      {34, "\0\0\0\0\0\0\0\7"s, "34: the table of offsets begins at 7, outside the document"},
+      {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"},
+      {9, "\x07"s, "9: object 0 stands at offset 7, outside the objects"},
+  };
+  for (const auto& row : rows) {
+    std::string bytes = good;
+    bytes.replace(row.at, row.bytes.size(), row.bytes);
+    EXPECT_EQ(errorOf(bytes), "binary property list, offset " + row.error);
+  }
+  for (std::size_t length = 8; length < good.size(); ++length)
+    EXPECT_NE(errorOf(good.substr(0, length)), "no error") << length;
+}
+
+TEST(Binary, ContentThatIsReferredToManyTimesIsLimited) {
+  // One mebibyte of data, referred to 65 times.
+  std::string bytes = "bplist00\xAF\x10\x41"s + std::string(65, '\1') + "\x4F\x12\x00\x10\x00\x00"s;
+  const std::size_t data = 8 + 3 + 65;
+  bytes += std::string(std::size_t{1} << 20, 'x');
+  const std::size_t table = bytes.size();
+  bytes += "\0\0\0\x08\0\0\0"s + static_cast<char>(data) + "\0\0\0\0\0\0\4\1"s;
+  bytes += "\0\0\0\0\0\0\0\2\0\0\0\0\0\0\0\0\0\0\0\0\0"s;
+  for (const unsigned shift : {16U, 8U, 0U})
+    bytes += static_cast<char>(table >> shift & 0xFF);
+  EXPECT_EQ(errorOf(bytes),
+            "binary property list, offset 76: texts and data, after shared references are "
+            "expanded, are more than 67108864 bytes");
+}
+
+TEST(Coding, RecognisesTheEncodingByContent) {
+  PlistCoding coding;
+  const Value value = Dictionary{{"a", Array{1, 2.5, "x"}}};
+  const std::string xml = *coding.encodeXml(value);
+  for (const std::string& bytes : {xml, "\xEF\xBB\xBF" + xml, *writeBinary(value)}) {
+    const auto read = coding.decode(asBytes(bytes));
+    ASSERT_TRUE(read) << read.error().message;
+    EXPECT_EQ(*read, value);
+  }
+  EXPECT_EQ(coding.decode({}).error().message, "not a property list: the document is empty");
+  EXPECT_EQ(coding.decode(asBytes("{a = 1;}")).error().message,
+            "not a property list: it begins neither with \"bplist00\" nor with \"<\"");
+  EXPECT_EQ(coding.decode(asBytes(" \n<html/>")).error().message,
+            "XML property list, line 2, column 1: <html> is no element of property lists");
+}
+
+}  // namespace
+}  // namespace tavrel::plist

@@ -1,0 +1,235 @@
+#include "platform/plist/xml.h"
+
+#include <cmath>
+#include <gtest/gtest.h>
+#include <limits>
+#include <string>
+#include <vector>
+
+#include "base/limits.h"
+
+namespace tavrel::plist {
+namespace {
+
+using namespace std::string_literals;
+
+std::string wrapped(const std::string& body) {
+  return "<?xml version=\"1.0\" encoding=\"UTF-8\"?>\n<plist version=\"1.0\">\n" + body +
+         "</plist>\n";
+}
+
+std::string errorOf(const std::string& document) {
+  const auto value = readXml(asBytes(document));
+  return value ? "no error" : value.error().message;
+}
+
+TEST(Xml, WritesSortedIndentedDocument) {
+  const std::vector<std::byte> bytes(58, std::byte{0xFF});
+  const Dictionary document{
+      {"b", Array{1, -2, true, false, Array::create(), Dictionary::create()}},
+      {"a<&>", "x<y>&\r\n\"'"},
+      {"c", Dictionary{{"when", Date::sinceEpoch(-0.25)}, {"bytes", Data(bytes)}}},
+      {"\xC3\xA9", ""},
+  };
+  const std::string line(76, '/');
+  EXPECT_EQ(*writeXml(document),
+            wrapped("<dict>\n"
+                    "\t<key>a&lt;&amp;&gt;</key>\n"
+                    "\t<string>x&lt;y&gt;&amp;&#13;\n\"'</string>\n"
+                    "\t<key>b</key>\n"
+                    "\t<array>\n"
+                    "\t\t<integer>1</integer>\n\t\t<integer>-2</integer>\n"
+                    "\t\t<true/>\n\t\t<false/>\n\t\t<array/>\n\t\t<dict/>\n"
+                    "\t</array>\n"
+                    "\t<key>c</key>\n"
+                    "\t<dict>\n"
+                    "\t\t<key>bytes</key>\n\t\t<data>\n\t\t" +
+                    line +
+                    "\n\t\t/w==\n\t\t</data>\n"
+                    "\t\t<key>when</key>\n\t\t<date>2000-12-31T23:59:59Z</date>\n"
+                    "\t</dict>\n"
+                    "\t<key>\xC3\xA9</key>\n\t<string></string>\n"
+                    "</dict>\n"));
+}
+
+TEST(Xml, ScalarsAreWrittenAndReadBack) {
+  constexpr double kInfinity = std::numeric_limits<double>::infinity();
+  const struct {
+    Value value;
+    std::string text;
+  } rows[] = {
+      {std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"},
+      {std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"},
+      {0.1, "<real>0.1</real>"},
+      {0.1F, "<real>0.10000000149011612</real>"},
+      {-0.0, "<real>-0</real>"},
+      {5e-324, "<real>5e-324</real>"},
+      {kInfinity, "<real>inf</real>"},
+      {-kInfinity, "<real>-inf</real>"},
+      {-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"},
+      {Date::ofDay(std::numeric_limits<std::int32_t>::max()),
+       "<date>5881580-07-11T00:00:00Z</date>"},
+      {Date::ofDay(std::numeric_limits<std::int32_t>::min()),
+       "<date>-5877641-06-23T00:00:00Z</date>"},
+      {Data(asBytes("ab")), "<data>\nYWI=\n</data>"},
+      {Data(asBytes("abc")), "<data>\nYWJj\n</data>"},
+      {Data(ByteSpan()), "<data>\n</data>"},
+      {" \t\n\r ", "<string> \t\n&#13; </string>"},
+      {"\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>"},
+  };
+  for (const auto& row : rows) {
+    const auto xml = writeXml(row.value);
+    ASSERT_TRUE(xml) << row.text;
+    EXPECT_EQ(*xml, wrapped(row.text + "\n"));
+    const auto value = readXml(asBytes(*xml));
+    ASSERT_TRUE(value) << value.error().message;
+    EXPECT_EQ(*value, row.value) << row.text;
+  }
+  EXPECT_TRUE(std::signbit(readXml(asBytes(wrapped("<real>-0</real>")))->number()->real()));
+}
+
+TEST(Xml, WhatXmlCannotHoldIsReplaced) {
+  const auto text = writeXml("a\0b\x1B\xEF\xBF\xBE\xED\xA0\x80z"s);
+  EXPECT_EQ(*text, wrapped("<string>a\uFFFDb\uFFFD\uFFFD\uFFFD\uFFFD\uFFFDz</string>\n"));
+
+  // Keys that become equal stay apart, also from a key that had the text before.
+  const Dictionary clash{{"k\x02", 2}, {"k\x01", 1}, {"k\uFFFD2", 3}, {"k", 0}};
+  const Dictionary apart{{"k", 0}, {"k\uFFFD", 1}, {"k\uFFFD2", 3}, {"k\uFFFD3", 2}};
+  const auto read = readXml(asBytes(*writeXml(clash)));
+  EXPECT_EQ(*read, Value(apart));
+  EXPECT_EQ(*writeXml(*read), *writeXml(clash));
+}
+
+TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
+  Array deep, cyclic;
+  for (std::size_t i = 0; i < limits::kPropertyListDepth; ++i)
+    deep = Array{deep};
+  Array deepest = Array{1};
+  for (std::size_t i = 1; i < limits::kPropertyListDepth; ++i)
+    deepest = Array{deepest};
+  cyclic = Array{1};
+  cyclic.append(cyclic);
+  Array wide{1, 2, 3, 4, 5, 6, 7, 8};
+  for (int i = 0; i < 6; ++i)
+    wide = Array{wide, wide, wide, wide, wide, wide, wide, wide};
+  Array large;
+  const std::string text(std::size_t{1} << 20, '&');
+  for (int i = 0; i < 14; ++i)
+    large.append(text);
+
+  const struct {
+    Value value;
+    std::string error;
+  } rows[] = {
+      {Value(), "cannot encode the property list, value /: null has no encoding"},
+      {Dictionary{{"a", Array{1, Value()}}},
+       "cannot encode the property list, value /a/1: null has no encoding"},
+      {Array{Date::sinceEpoch(std::numeric_limits<double>::quiet_NaN())},
+       "cannot encode the property list, value /0: no calendar reaches the date"},
+      {Date::sinceEpoch(1e300),
+       "cannot encode the property list, value /: no calendar reaches the date"},
+      {Value(cyclic),
+       "cannot encode the property list: containers nest deeper than 128, or one contains itself"},
+      {wide, "cannot encode the property list: it has more than 1000000 values"},
+      {large, "cannot encode the property list: the document is longer than 67108864 bytes"},
+  };
+  for (const auto& row : rows) {
+    const auto xml = writeXml(row.value);
+    EXPECT_EQ(xml ? "no error" : xml.error().message, row.error);
+  }
+  cyclic.remove(1);
+  EXPECT_EQ(*readXml(asBytes(*writeXml(deepest))), Value(deepest));
+}
+
+TEST(Xml, ReadsWhatOthersWrite) {
+  const Dictionary expected{{"caf\xC3\xA9", Array{"<b>A", -31, Data(asBytes("abc")), 1.5, true}}};
+  const std::string body =
+      "<plist><!-- c --><dict><?x y?>\n<key>caf\xE9</key>\n<array><string><![CDATA[<b>]]>&#x41;"
+      "</string><integer> -0x1F\n</integer>\n<data>\n\tYW\n\tJj </data><real> +1.50 </real><true> "
+      "</true></array></dict></plist>";
+  const std::string latin =
+      "<?xml version='1.0' encoding='ISO-8859-1'?>"
+      "<!DOCTYPE plist SYSTEM \"plist.dtd\" [<!ELEMENT plist ANY>]>" +
+      body;
+  std::string utf16 = "\xFF\xFE";
+  for (const char character : body)
+    utf16 += {character, '\0'};
+  for (const std::string& document : {latin, utf16}) {
+    const auto value = readXml(asBytes(document));
+    ASSERT_TRUE(value) << value.error().message;
+    EXPECT_EQ(*value, Value(expected));
+  }
+  const auto twice = readXml(asBytes(wrapped(
+      "<dict><key>a</key><true/><key>a</key><integer>9223372036854775808</integer></dict>")));
+  EXPECT_EQ(*twice, Value(Dictionary{{"a", std::uint64_t{1} << 63}}));
+  EXPECT_EQ(twice->dictionary().number("a")->kind(), NumberKind::UInt64);
+}
+
+TEST(Xml, ErrorsSayWhatAndWhere) {
+  const struct {
+    std::string body;
+    std::string error;  // behind "line 3, column "
+  } rows[] = {
+      {"", "1: <plist> holds no value"},
+      {"<set/>", "1: <set> is no element of property lists"},
+      {"<plist/>", "1: <plist> stands inside <plist>"},
+      {"<true/><true/>", "8: <true> is a second value"},
+      {"<key>a</key>", "1: <key> stands outside <dict>"},
+      {"<array><key>a</key></array>", "8: <key> stands outside <dict>"},
+      {"<dict><true/></dict>", "7: <true> stands where <key> should"},
+      {"<dict><key>a</key></dict>", "19: the last <key> of a <dict> has no value"},
+      {"<dict><key>a</key><key>b</key></dict>", "19: <key> stands where the value of a key should"},
+      {"<string>a<true/></string>", "10: <true> stands where only text may"},
+      {"<array>x</array>", "8: text stands outside an element that holds text"},
+      {"<true>x</true>", "7: text stands outside an element that holds text"},
+      {"<integer></integer>", "10: \"\" is no integer of 64 bits"},
+      {"<integer>--1</integer>", "13: \"--1\" is no integer of 64 bits"},
+      {"<integer>" + std::string(59, '9') + "\xC3\xA9</integer>",
+       "70: \"" + std::string(59, '9') + "...\" is no integer of 64 bits"},
+      {"<integer>1.0</integer>", "13: \"1.0\" is no integer of 64 bits"},
+      {"<integer>18446744073709551616</integer>",
+       "30: \"18446744073709551616\" is no integer of 64 bits"},
+      {"<integer>-9223372036854775809</integer>",
+       "30: \"-9223372036854775809\" is no integer of 64 bits"},
+      {"<real>1e999</real>", "12: \"1e999\" is no real number that a double holds"},
+      {"<real>+-1</real>", "10: \"+-1\" is no real number that a double holds"},
+      {"<real>nan(1)</real>", "13: \"nan(1)\" is no real number that a double holds"},
+      {"<date>2026-02-29T00:00:00Z</date>",
+       "27: \"2026-02-29T00:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
+      {"<date>2026-02-28T24:00:00Z</date>",
+       "27: \"2026-02-28T24:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
+      {"<data>YWJ</data>", "10: the text of <data> is not base64"},
+      {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"},
+      {"<data>Y-==</data>", "11: the text of <data> is not base64"},
+      {"<string>&foo;</string>", "9: undefined entity"},
+      {"<string></integer>", "11: mismatched tag"},
+  };
+  for (const auto& row : rows) {
+    const std::string error = errorOf(wrapped(row.body));
+    EXPECT_EQ(error, "XML property list, line 3, column " + row.error) << row.body;
+  }
+  EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
+            "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is no integer of 64 bits");
+  EXPECT_EQ(errorOf(wrapped("<true/>") + "<x/>"),
+            "XML property list, line 4, column 1: junk after document element");
+  EXPECT_EQ(errorOf("<dict/>"),
+            "XML property list, line 1, column 1: <dict> stands where <plist> should");
+  EXPECT_EQ(errorOf("<!DOCTYPE p [<!ENTITY a \"b\">]><plist><string>&a;</string></plist>"),
+            "XML property list, line 1, column 25: entity \"a\" is declared; a property list may "
+            "declare none");
+  EXPECT_EQ(errorOf("<!DOCTYPE p SYSTEM \"p\"><plist><string>&a;</string></plist>"),
+            "XML property list, line 1, column 39: entity \"a\" is not known");
+  std::string deep;
+  for (int i = 0; i < 129; ++i)
+    deep += "<array>";
+  EXPECT_EQ(errorOf(wrapped(deep)),
+            "XML property list, line 3, column 897: containers nest deeper than 128");
+  std::string wide = "<array>";
+  for (std::size_t i = 0; i < limits::kPropertyListValues; ++i)
+    wide += "<true/>";
+  EXPECT_EQ(errorOf(wrapped(wide)),
+            "XML property list, line 3, column 7000001: there are more than 1000000 values");
+}
+
+}  // namespace
+}  // namespace tavrel::plist
