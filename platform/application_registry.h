@@ -11,6 +11,8 @@ namespace tavrel {
 
 /// The bundle type of applications that the user installed.
 inline constexpr std::string_view PWUserApplicationType = "User";
+/// The bundle type of applications that came with the system.
+inline constexpr std::string_view kSystemApplicationType = "System";
 
 /// The bundle kind that stands for all installed applications.
 inline constexpr std::uint32_t kInstalledApplications = 1;

@@ -4,34 +4,46 @@
 // services takes `Platform&`; one that needs a single service takes that service.
 #pragma once
 
+#include "platform/application_registry.h"
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
 #include "platform/device_answers.h"
 #include "platform/digest.h"
+#include "platform/dynamic_loading.h"
 #include "platform/event_loop.h"
 #include "platform/files.h"
+#include "platform/locale.h"
+#include "platform/named_service.h"
+#include "platform/notifications.h"
 #include "platform/preferences.h"
 #include "platform/process_state.h"
 #include "platform/property_list_coding.h"
 #include "platform/statistics_store.h"
 #include "platform/submission.h"
+#include "platform/system_controls.h"
 #include "platform/system_log.h"
 #include "platform/system_version.h"
 
 namespace tavrel {
 
 struct Platform {
+  PWApplicationWorkspace& applications;
   Clock& clock;
   CrashReporting& crashReporting;
   DeviceAnswers& deviceAnswers;
   Digest& digest;
+  DynamicLoader& dynamicLoader;
   EventLoop& eventLoop;
   Files& files;
+  Locale& locale;
+  SystemLog& log;
+  NamedServices& namedServices;
+  Notifications& notifications;
   Preferences& preferences;
   PropertyListCoding& propertyLists;
   StatisticsStore& statistics;
   SubmissionService& submission;
-  SystemLog& log;
+  SystemControls& systemControls;
   SystemVersion& systemVersion;
   ProcessState& state;
 };

@@ -51,6 +51,7 @@ class BHHistoryDistributionEnumerator {
 /// A reader of the store. Queries select the rows whose key begins with the prefix and whose day
 /// lies above `minDaysSince1970` and not above `maxDaysSince1970`. Rows arrive ordered by key
 /// (bytewise), then by day, before the query returns; the handler may set `stop` to end it early.
+/// Bounds are wider than days, so that the day before the first one can be named.
 class BHHistory {
  public:
   using ScalarRowHandler =
@@ -61,11 +62,11 @@ class BHHistory {
 
   virtual ~BHHistory() = default;
 
-  virtual void scalarsForKeyPrefix(std::string_view prefix, std::int32_t minDaysSince1970,
-                                   std::int32_t maxDaysSince1970,
+  virtual void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                                   std::int64_t maxDaysSince1970,
                                    const ScalarRowHandler& rowHandler) = 0;
-  virtual void distributionsForKeyPrefix(std::string_view prefix, std::int32_t minDaysSince1970,
-                                         std::int32_t maxDaysSince1970,
+  virtual void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                                         std::int64_t maxDaysSince1970,
                                          const DistributionRowHandler& rowHandler) = 0;
 };
 

@@ -1,0 +1,43 @@
+// Finds the longest of many prefixes that a key begins with, in time that depends on the key's
+// length and not on the number of prefixes.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace tavrel {
+
+/// A radix tree over a fixed set of prefixes, which it copies.
+class PrefixTree {
+ public:
+  PrefixTree() = default;
+  explicit PrefixTree(std::vector<std::string> prefixes);
+
+  /// The longest prefix that `key` begins with, borrowed from the tree; nothing when there is none.
+  std::optional<std::string_view> longestMatch(std::string_view key) const;
+
+ private:
+  // A node stands for the text from the root to it, which is the beginning of all prefixes below.
+  // `depth` is the length of that text. The children of a node lie side by side, ordered by the
+  // byte that follows its text.
+  struct Node {
+    std::uint32_t prefix;  // any prefix below the node, which spells its text
+    std::uint32_t depth;
+    std::uint32_t firstChild;
+    std::uint16_t childCount;
+    bool isPrefix;  // the node's text is itself a prefix
+  };
+
+  void build(std::size_t node, std::size_t begin, std::size_t end);
+  const Node* childFor(const Node& node, unsigned char next) const;
+
+  std::vector<std::string> prefixes_;  // sorted, each once
+  std::vector<Node> nodes_;            // the root first
+  std::vector<unsigned char> branch_;  // for each node the byte that leads to it
+};
+
+}  // namespace tavrel

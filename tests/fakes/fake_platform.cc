@@ -1,0 +1,116 @@
+#include "tests/fakes/fake_platform.h"
+
+#include <algorithm>
+#include <cerrno>
+
+namespace tavrel::fakes {
+namespace {
+
+class FakeHistory : public BHHistory {
+ public:
+  explicit FakeHistory(FakeStore& store) : store_(store) {}
+
+  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
+                           const ScalarRowHandler& handler) override {
+    bool stop = false;
+    for (const auto& [key, day, value] : store_.scalars) {
+      if (key.starts_with(prefix) && day > min && day <= max) handler(key, day, value, stop);
+    }
+  }
+
+  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
+                                 const DistributionRowHandler& handler) override {
+    bool stop = false;
+    for (const auto& [key, day, values] : store_.distributions) {
+      if (!key.starts_with(prefix) || day <= min || day > max) continue;
+      FakeDistribution enumerator(values);
+      handler(key, day, enumerator, stop);
+      if (enumerator.wasRead) store_.keysRead.insert(key);
+    }
+  }
+
+ private:
+  FakeStore& store_;
+};
+
+class StringLogFile : public LogFile {
+ public:
+  void write(ByteSpan bytes) override { content += asText(bytes); }
+  std::string content;
+};
+
+class FakeLibrary : public DynamicLibrary {
+ public:
+  explicit FakeLibrary(FakeLoader& loader) : loader_(loader) {}
+
+  LibraryFunction find(std::string_view function) override {
+    if (loader_.missing.contains(function)) return {};
+    Preferences& preferences = loader_.preferences;
+    if (function == "ZTXPreferencesGetIntegerValue") {
+      return IntegerPreferenceGetter([&preferences](std::string_view key, std::string_view domain) {
+        return preferences.ZTXPreferencesGetIntegerValue(key, domain);
+      });
+    }
+    return PreferenceSetter(
+        [&preferences](std::string_view key, const plist::Value& value, std::string_view domain) {
+          preferences.ZTXPreferencesSetValue(key, value, domain);
+        });
+  }
+
+ private:
+  FakeLoader& loader_;
+};
+
+class FakeListener : public ServiceListener {
+ public:
+  FakeListener(FakeServices& services, std::string_view name) : services_(services), name_(name) {}
+  void setPeerHandler(PeerHandler handler) override { services_.peerHandler = std::move(handler); }
+  void resume() override { services_.name = name_; }
+
+ private:
+  FakeServices& services_;
+  std::string name_;
+};
+
+}  // namespace
+
+SystemControls::Result FakeControls::read(std::string_view name, MutableByteSpan buffer) {
+  const auto at = values.find(name);
+  if (at == values.end()) return {ENOENT, 0};
+  if (at->second.size() > buffer.size()) return {ENOMEM, 0};
+  std::copy(at->second.begin(), at->second.end(), buffer.begin());
+  return {0, at->second.size()};
+}
+
+std::unique_ptr<DynamicLibrary> FakeLoader::load(std::string_view) {
+  ++loads;
+  if (!isPresent) return nullptr;
+  return std::make_unique<FakeLibrary>(*this);
+}
+
+std::unique_ptr<ServiceListener> FakeServices::createListener(std::string_view serviceName) {
+  if (!available) return nullptr;
+  return std::make_unique<FakeListener>(*this, serviceName);
+}
+
+std::unique_ptr<BHHistory> FakeStore::initWithDefaultPath() {
+  return std::make_unique<FakeHistory>(*this);
+}
+
+bool FakeSubmission::ZTXWriteLogForSubmission(std::string_view type, std::string_view name,
+                                              const plist::Dictionary& options,
+                                              const LogWriter& writer) {
+  journal.push_back("write log");
+  if (fails) return false;
+  StringLogFile file;
+  writer(file);
+  logs.push_back({std::string(type), std::string(name), options, file.content});
+  return true;
+}
+
+void FakePlatform::setWhitelist(const plist::Dictionary& groups) {
+  files.contents["/Library/Application Support/Brimhold/Whitelist_Pellio.plist"] =
+      *propertyLists.encodeXml(groups);
+}
+
+}  // namespace tavrel::fakes

@@ -1,0 +1,323 @@
+// A platform in memory for tests: services that hold state, with public fields to set up and a
+// record of what was done to them. Property lists are coded for real.
+#pragma once
+
+#include <deque>
+#include <map>
+#include <optional>
+#include <set>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "platform/platform.h"
+#include "platform/plist/coding.h"
+#include "tests/fakes/plist_matching.h"
+
+namespace tavrel::fakes {
+
+/// Calls in the order in which they were made, where the order matters.
+using Journal = std::vector<std::string>;
+
+struct FakeClock : Clock {
+  plist::Date instant = plist::Date::ofDay(20000);
+  std::uint64_t tickCount = 0;
+  std::optional<TimeBase> base = TimeBase{1, 1};
+
+  plist::Date now() override { return instant; }
+  std::uint64_t ticks() override { return tickCount; }
+  std::optional<TimeBase> timeBase() override { return base; }
+};
+
+struct FakeLog : SystemLog {
+  std::vector<std::pair<LogLevel, std::string>> entries;
+
+  void write(LogLevel level, std::string_view message) override {
+    entries.emplace_back(level, message);
+  }
+  /// The messages at a level, or at all levels but debug.
+  std::vector<std::string> messages(std::optional<LogLevel> level = {}) const {
+    std::vector<std::string> texts;
+    for (const auto& [entryLevel, text] : entries) {
+      if (level ? entryLevel == *level : entryLevel != LogLevel::Debug) texts.push_back(text);
+    }
+    return texts;
+  }
+};
+
+struct FakePreferences : Preferences {
+  explicit FakePreferences(Journal& journalOfCalls) : journal(journalOfCalls) {}
+  Journal& journal;
+  std::map<std::string, plist::Dictionary, std::less<>> domains;
+
+  plist::Dictionary& domain(std::string_view name) {
+    auto at = domains.find(name);
+    if (at == domains.end()) at = domains.emplace(name, plist::Dictionary::create()).first;
+    return at->second;
+  }
+  plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view name) override {
+    return plist::deepCopy(domain(name).get(key));
+  }
+  void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
+                              std::string_view name) override {
+    journal.push_back(format("%s %s %s", value ? "set" : "remove", name, key));
+    domain(name).set(key, plist::deepCopy(value));
+  }
+  bool ZTXPreferencesSynchronize(std::string_view name) override {
+    journal.push_back(format("synchronize %s", name));
+    return true;
+  }
+};
+
+struct FakeDistribution : BHHistoryDistributionEnumerator {
+  explicit FakeDistribution(const std::vector<double>& values) {
+    for (const double value : values)
+      samples.push_back({value, 0});
+  }
+  std::vector<Sample> samples;
+  bool wasRead = false;
+
+  std::span<const Sample> nextBlock() override {
+    if (std::exchange(wasRead, true)) return {};
+    return samples;
+  }
+};
+
+struct FakeStore : StatisticsStore {
+  explicit FakeStore(Journal& journalOfCalls) : journal(journalOfCalls) {}
+  Journal& journal;
+  std::int32_t today = 20000;
+  std::vector<std::tuple<std::string, std::int32_t, std::int64_t>> scalars;
+  std::vector<std::tuple<std::string, std::int32_t, std::vector<double>>> distributions;
+  std::set<std::string> keysRead;  // distributions whose values were asked for
+
+  std::int32_t BHDaysSince1970() override { return today; }
+  plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
+  void BHClientCheckpoint() override { journal.push_back("checkpoint"); }
+  void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
+    scalars.emplace_back(key, today, value);
+  }
+  std::unique_ptr<BHHistory> initWithDefaultPath() override;
+};
+
+struct FakeSubmission : SubmissionService {
+  explicit FakeSubmission(Journal& journalOfCalls) : journal(journalOfCalls) {}
+  struct Log {
+    std::string type, name;
+    plist::Dictionary options;
+    std::string content;
+  };
+  Journal& journal;
+  bool enabled = true;
+  bool fails = false;
+  std::string osVersion = "Pellio 7.1 (21A5)";
+  std::set<std::string, std::less<>> internalDiagnostics;
+  plist::Dictionary taskingValues = plist::Dictionary::create();
+  std::vector<Log> logs;
+
+  bool isDiagnosticSubmissionEnabled() override { return enabled; }
+  bool hasInternalDiagnostics(std::string_view identifier) override {
+    return internalDiagnostics.contains(identifier);
+  }
+  bool ZTXWriteLogForSubmission(std::string_view type, std::string_view name,
+                                const plist::Dictionary& options, const LogWriter& writer) override;
+  std::string ZTXOSVersion() override { return osVersion; }
+  plist::Value ZTXGetDATaskingValue(std::string_view key) override {
+    return taskingValues.get(key);
+  }
+  void submitDiagnosticLogs() override { journal.push_back("submit now"); }
+
+  /// The last log, read back.
+  plist::Dictionary lastLog() const {
+    if (logs.empty()) return {};
+    const auto value = plist::PlistCoding().decode(asBytes(logs.back().content));
+    return value ? value->dictionary() : plist::Dictionary();
+  }
+};
+
+struct FakeCrashReporting : CrashReporting {
+  explicit FakeCrashReporting(Journal& journalOfCalls) : journal(journalOfCalls) {}
+  Journal& journal;
+  std::vector<std::pair<std::uint32_t, plist::Dictionary>> records;
+
+  void FLLogStructuredData(std::uint32_t type, const plist::Dictionary& record) override {
+    records.emplace_back(type, record);
+  }
+  void FLDumpAllOldStructuredDataLogs() override { journal.push_back("clean structured logs"); }
+  void rollNorvaneCareLogs() override { journal.push_back("roll support log"); }
+  std::string systemIdentifier() override { return "system-id"; }
+  std::string hardwareModel() override { return "Model1,1"; }
+  std::string osVersion() override { return "Pellio 7.1 (21A5)"; }
+  std::string incidentIdentifier() override { return "incident-id"; }
+};
+
+struct FakeAnswers : DeviceAnswers {
+  plist::Dictionary answers = plist::Dictionary::create();
+  std::vector<std::string> questions;
+
+  plist::Value SQCopyAnswer(std::string_view question) override {
+    questions.emplace_back(question);
+    return answers.get(question);
+  }
+};
+
+/// Counts up from 0 whatever the bytes are.
+struct FakeDigest : Digest {
+  std::array<std::byte, 16> md5(ByteSpan) override {
+    std::array<std::byte, 16> digest{};
+    for (std::size_t i = 0; i < digest.size(); ++i)
+      digest[i] = static_cast<std::byte>(i);
+    return digest;
+  }
+};
+
+struct FakeFiles : Files {
+  std::map<std::string, std::string, std::less<>> contents;
+
+  Expected<std::string> read(std::string_view path, std::size_t largest) override {
+    const auto at = contents.find(path);
+    if (at == contents.end()) return Error{"no such file"};
+    if (at->second.size() > largest) return Error{"too large"};
+    return at->second;
+  }
+  std::optional<std::int64_t> size(std::string_view path) override {
+    const auto at = contents.find(path);
+    if (at == contents.end()) return std::nullopt;
+    return static_cast<std::int64_t>(at->second.size());
+  }
+};
+
+struct FakeSystemVersion : SystemVersion {
+  plist::Dictionary version{{kProductBuildVersionKey, "21A5"}};
+  plist::Dictionary systemVersionDictionary() override { return version; }
+};
+
+/// Plays a list of events; every slice behind them runs out of time.
+struct FakeEventLoop : EventLoop {
+  std::deque<std::function<void()>> events;
+  bool terminates = false;
+  std::vector<std::chrono::milliseconds> slices;
+
+  Slice runSlice(std::chrono::milliseconds longest) override {
+    slices.push_back(longest);
+    if (events.empty()) return terminates ? Slice::Terminated : Slice::TimedOut;
+    const auto event = events.front();
+    events.pop_front();
+    event();
+    return Slice::HandledEvent;
+  }
+};
+
+struct FakeApplications : PWApplicationWorkspace {
+  std::vector<PWBundleProxy> bundles;
+  int enumerations = 0;
+
+  void enumerateBundles(std::uint32_t kind,
+                        const std::function<void(const PWBundleProxy&)>& handler) override {
+    ++enumerations;
+    if (kind != kInstalledApplications) return;
+    for (const PWBundleProxy& bundle : bundles)
+      handler(bundle);
+  }
+};
+
+struct FakeLocale : Locale {
+  std::vector<std::string> preferred, matched;
+  std::optional<std::string> country;
+
+  std::vector<std::string> preferredLanguages() override { return preferred; }
+  std::vector<std::string> systemLanguages() override { return {"en", "de"}; }
+  std::vector<std::string> matchLocalizations(const std::vector<std::string>&,
+                                              const std::vector<std::string>&) override {
+    return matched;
+  }
+  std::optional<std::string> countryCode() override { return country; }
+};
+
+/// Controls with a value; all others do not exist.
+struct FakeControls : SystemControls {
+  std::map<std::string, std::vector<std::byte>, std::less<>> values;
+
+  Result read(std::string_view name, MutableByteSpan buffer) override;
+};
+
+struct FakeNotifications : Notifications {
+  explicit FakeNotifications(Journal& journalOfCalls) : journal(journalOfCalls) {}
+  Journal& journal;
+
+  void post(std::string_view name) override { journal.push_back(format("post %s", name)); }
+};
+
+/// A library whose presence and functions can be switched off.
+struct FakeLoader : DynamicLoader {
+  explicit FakeLoader(Preferences& preferencesBehind) : preferences(preferencesBehind) {}
+  Preferences& preferences;
+  bool isPresent = true;
+  std::set<std::string, std::less<>> missing;
+  int loads = 0;
+
+  std::unique_ptr<DynamicLibrary> load(std::string_view path) override;
+};
+
+/// Hands the peer of a test to whoever listens.
+struct FakeServices : NamedServices {
+  struct Peer : PeerConnection {
+    EventHandler handler;
+    bool resumed = false;
+    void setEventHandler(EventHandler newHandler) override { handler = std::move(newHandler); }
+    void resume() override { resumed = true; }
+  };
+  bool available = true;
+  std::string name;  // of the service listened on, once its listener was resumed
+  ServiceListener::PeerHandler peerHandler;
+
+  std::unique_ptr<ServiceListener> createListener(std::string_view serviceName) override;
+};
+
+/// All of them, and the `Platform` over them.
+struct FakePlatform {
+  Journal journal;
+  FakeApplications applications;
+  FakeClock clock;
+  FakeCrashReporting crashReporting{journal};
+  FakeAnswers answers;
+  FakeDigest digest;
+  FakePreferences preferences{journal};
+  FakeLoader loader{preferences};
+  FakeEventLoop eventLoop;
+  FakeFiles files;
+  FakeLocale locale;
+  FakeLog log;
+  FakeServices services;
+  FakeNotifications notifications{journal};
+  plist::PlistCoding propertyLists;
+  FakeStore store{journal};
+  FakeSubmission submission{journal};
+  FakeControls controls;
+  FakeSystemVersion systemVersion;
+  ProcessState state;
+  Platform platform{.applications = applications,
+                    .clock = clock,
+                    .crashReporting = crashReporting,
+                    .deviceAnswers = answers,
+                    .digest = digest,
+                    .dynamicLoader = loader,
+                    .eventLoop = eventLoop,
+                    .files = files,
+                    .locale = locale,
+                    .log = log,
+                    .namedServices = services,
+                    .notifications = notifications,
+                    .preferences = preferences,
+                    .propertyLists = propertyLists,
+                    .statistics = store,
+                    .submission = submission,
+                    .systemControls = controls,
+                    .systemVersion = systemVersion,
+                    .state = state};
+
+  /// Puts a whitelist in its place.
+  void setWhitelist(const plist::Dictionary& groups);
+};
+
+}  // namespace tavrel::fakes
