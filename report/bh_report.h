@@ -1,0 +1,91 @@
+// The report of one day: the whitelisted statistics of that day, coarsened, with what the daemon
+// measures itself, in one property list that is handed to the submission service.
+//
+//   BHReport(platform).writeLogForYesterday(day, appInfo);
+//
+// One report is made per daily run, written once and dropped.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+#include "config/bh_config.h"
+#include "platform/platform.h"
+
+namespace tavrel {
+
+/// Under which the submission service files the log.
+inline constexpr std::string_view kTalliedLogType = "193";
+inline constexpr std::string_view kTalliedLogName = "log-tallied";
+
+/// The domain of the daemon's own state, and the name of its service.
+inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
+
+class BHReport {
+ public:
+  /// Loads the whitelist; without one nothing is collected. The platform must outlive the report.
+  explicit BHReport(Platform& platform);
+
+  /// Collects the statistics of a day and serialises them. `withAppInfo` is the list of activated
+  /// applications, an empty handle when the caller has none.
+  void writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo);
+
+  /// Adds the probes to what was collected, builds the log and submits it. A report in which
+  /// nothing was collected does nothing.
+  void serializeWithDate(std::int32_t day, const plist::Array& andAppInfo);
+
+  // Scalars.
+
+  /// Coarsens `value` as the options ask, stores it and yields what was stored.
+  std::int64_t addScalar(std::int64_t value, std::string_view forKey,
+                         const plist::Dictionary& withOptions);
+
+  /// Adds a scalar whose value is costly: the block runs only when the key is whitelisted.
+  void addScalarForKey(std::string_view key, const std::function<std::int64_t()>& byExecutingBlock);
+
+  // Distributions.
+
+  /// Stores the summary of the values, and their histogram when the options have "intervals".
+  void computeAndAddDistribution(BHHistoryDistributionEnumerator& values, std::string_view forKey,
+                                 const plist::Dictionary& withOptions);
+
+  // Probes: what the daemon measures itself. Each scalar is measured only when it is whitelisted.
+
+  /// Counts of installed applications, of all and of those that the user installed.
+  void addInstalledAppInfo();
+  /// Languages and region, without regard to the whitelist.
+  void addMetadataKeys();
+  /// Size of the statistics database in MiB, and how often it was found corrupt since last asked.
+  void reportDatabaseSize();
+  /// Minutes since the device started.
+  void reportCPUUptime();
+  /// Counters of the virtual-memory freezer, and swap.
+  void reportVMStats();
+
+ private:
+  void collect(std::int32_t day);
+
+  // An empty handle for a key that may not be reported.
+  plist::Dictionary optionsForScalar(std::string_view key) const;
+  plist::Dictionary optionsForDistribution(std::string_view key) const;
+
+  plist::Dictionary logDictionary(std::int32_t day, const plist::Array& appInfo,
+                                  const std::string& whitelistDigest);
+  plist::Dictionary submissionOptions();
+  std::int64_t takeCorruptionCount();
+  void noteOSVersion(plist::Dictionary& options);
+  void addConfigNumber(plist::Dictionary& options);
+
+  Platform& platform_;
+  std::unique_ptr<BHConfig> _config;
+  plist::Dictionary _scalarsOutput = plist::Dictionary::create();
+  plist::Dictionary _distributionsOutput = plist::Dictionary::create();
+  plist::Dictionary _histogramsOutput = plist::Dictionary::create();
+  plist::Dictionary _metadataOutput = plist::Dictionary::create();
+};
+
+}  // namespace tavrel

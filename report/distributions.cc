@@ -1,0 +1,70 @@
+#include "report/bh_report.h"
+#include "report/histogram.h"
+
+namespace tavrel {
+namespace {
+
+/// Welford's running summary: one pass, constant memory.
+class Summary {
+ public:
+  void add(double value) {
+    if (count_ == 0) {
+      minimum_ = maximum_ = mean_ = value;
+      count_ = 1;
+      return;
+    }
+    if (value < minimum_) {
+      minimum_ = value;
+    } else if (value > maximum_) {
+      maximum_ = value;
+    }
+    ++count_;
+    const double delta = value - mean_;
+    mean_ += delta / static_cast<std::int32_t>(count_);
+    squaredDeviations_ += delta * (value - mean_);
+  }
+
+  plist::Array numbers() const {
+    return {minimum_, maximum_, mean_, squaredDeviations_, static_cast<std::int32_t>(count_)};
+  }
+
+ private:
+  double minimum_ = 0;
+  double maximum_ = 0;
+  double mean_ = 0;
+  double squaredDeviations_ = 0;
+  std::uint32_t count_ = 0;  // read as a signed number of 32 bits
+};
+
+}  // namespace
+
+void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values,
+                                         std::string_view forKey,
+                                         const plist::Dictionary& withOptions) {
+  std::optional<Histogram> histogram;
+  const plist::Array intervals = withOptions.array(kIntervalsOption);
+  if (intervals) {
+    platform_.log.log(LogLevel::Debug, "Treating key %@ as a histogram", forKey);
+    histogram = Histogram::create(intervals);
+    if (!histogram) {
+      platform_.log.log(
+          LogLevel::Default,
+          "Couldn't allocate histCounts for key %@. Will not calculate histogram values", forKey);
+    }
+  }
+
+  Summary summary;
+  double value = 0;
+  std::uint32_t secondsInDay = 0;
+  while (values.getNextValue(value, secondsInDay)) {
+    summary.add(value);
+    if (histogram) histogram->count(value);
+  }
+
+  if (histogram) {
+    _histogramsOutput.set(forKey, histogramDictForIntervals(intervals, histogram->counts()));
+  }
+  _distributionsOutput.set(forKey, summary.numbers());
+}
+
+}  // namespace tavrel

@@ -1,0 +1,103 @@
+#include <string>
+
+#include "base/utf8.h"
+#include "report/bh_report.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kLastOSVersionKey = "LastOSVersion";
+constexpr std::string_view kInternalDiagnosticsIdentifier = "com.norvane.zentrix.tallied.tavrel";
+
+constexpr std::int32_t kLogVersion = 1;
+
+// The text before the first NUL of `bytes`, or nothing when it is no UTF-8.
+std::optional<std::string_view> terminatedText(ByteSpan bytes) {
+  const std::string_view text = asText(bytes);
+  const std::string_view terminated = text.substr(0, text.find('\0'));
+  if (!isValidUtf8(terminated)) return std::nullopt;
+  return terminated;
+}
+
+plist::Value orDefault(plist::Value value, plist::Value fallback) {
+  return value.isNull() ? fallback : value;
+}
+
+}  // namespace
+
+void BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInfo) {
+  if (_scalarsOutput.empty() && _distributionsOutput.empty() && _histogramsOutput.empty()) return;
+
+  addInstalledAppInfo();
+  addMetadataKeys();
+  reportDatabaseSize();
+  reportCPUUptime();
+  reportVMStats();
+
+  const std::string whitelistDigest = _config ? _config->configFileDigest() : std::string();
+  _config.reset();
+
+  const auto encoded =
+      platform_.propertyLists.encodeXml(logDictionary(day, andAppInfo, whitelistDigest));
+  if (!encoded) {
+    platform_.log.log(LogLevel::Error, "Could not create tallied plist: %@",
+                      encoded.error().message);
+    return;
+  }
+
+  const bool submitted = platform_.submission.ZTXWriteLogForSubmission(
+      kTalliedLogType, kTalliedLogName, submissionOptions(),
+      [&](LogFile& file) { file.write(asBytes(*encoded)); });
+  if (!submitted) platform_.log.log(LogLevel::Error, "Failed to write tallied log");
+}
+
+plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& appInfo,
+                                          const std::string& whitelistDigest) {
+  Preferences& preferences = platform_.preferences;
+  const auto taskingID = preferences.ZTXPreferencesGetValue("TaskingID", kTavrelDomain);
+  const auto taskingDigest = preferences.ZTXPreferencesGetValue("TaskingDigest", kTavrelDomain);
+  const auto taskingPayload = preferences.ZTXPreferencesGetValue("TaskingPayload", kTavrelDomain);
+
+  plist::Dictionary log{
+      {"BHCrashLogVersion", kLogVersion},
+      {"BHStartDate", platform_.statistics.dateForDaysSince1970(day)},
+      {"BHLogCreationDate", platform_.clock.now()},
+      {"BHMetadata", _metadataOutput},
+      {"BHScalars", _scalarsOutput},
+      {"BHDistributions", _distributionsOutput},
+      {"BHDistributionsHistogram", _histogramsOutput},
+      {"BHTasking", orDefault(taskingPayload, plist::Array::create())},
+      {"BHTaskID", orDefault(taskingID, "(no tasking id)")},
+      {"BHTaskDigest", orDefault(taskingDigest, "(no tasking digest)")},
+      {"BHWhitelistDigest", whitelistDigest},
+  };
+  if (appInfo) log.set("BHActivatedAppInfo", appInfo);
+  return log;
+}
+
+// An empty handle when there are none.
+plist::Dictionary BHReport::submissionOptions() {
+  plist::Dictionary options;
+  noteOSVersion(options);
+  addConfigNumber(options);
+  return options;
+}
+
+void BHReport::noteOSVersion(plist::Dictionary& options) {
+  Preferences& preferences = platform_.preferences;
+  const plist::Value stored = preferences.ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain);
+  const plist::Value current = platform_.submission.ZTXOSVersion();
+  if (current == stored) return;
+  preferences.ZTXPreferencesSetValue(kLastOSVersionKey, current, kTavrelDomain);
+  preferences.ZTXPreferencesSynchronize(kTavrelDomain);
+  options.set("previous_os_version", stored.string().value_or("<unknown>"));
+}
+
+void BHReport::addConfigNumber(plist::Dictionary& options) {
+  if (!platform_.submission.hasInternalDiagnostics(kInternalDiagnosticsIdentifier)) return;
+  const auto answer = platform_.deviceAnswers.SQCopyAnswer("ConfigNumber").data();
+  if (!answer) return;
+  if (const auto text = terminatedText(answer.bytes())) options.set("ConfigNumber", *text);
+}
+
+}  // namespace tavrel
