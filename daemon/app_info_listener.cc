@@ -1,0 +1,68 @@
+#include "daemon/app_info_listener.h"
+
+#include "daemon/app_info.h"
+#include "daemon/daily_run.h"
+
+namespace tavrel {
+namespace {
+
+enum Operation : std::int32_t { kAnnounce = 0, kForceDay = 1, kDeliver = 2 };
+
+void deliver(Platform& platform, const plist::Array& appData) {
+  bool& requested = platform.state.appInfoRequested;
+  const plist::Array appInfo = appInfoFrom(appData);
+  platform.log.log(LogLevel::Default, "tavrel got %sAAI:\n%@",
+                   requested ? "requested" : "(unsolicited -- so ignoring) ", appInfo);
+  if (!requested) return;
+  runDailyIfNeeded(platform, appInfo);
+  requested = false;
+}
+
+void announce(Platform& platform) {
+  platform.state.appInfoRequested = true;
+  platform.notifications.post(kLoggingNotification);
+  platform.log.log(LogLevel::Default, "notified of logging status, waiting for activate app info");
+}
+
+void forceDay(Platform& platform, const plist::Dictionary& message) {
+  const auto day = message.number("value");
+  dailyTasksForDay(platform, day ? day->int32() : 0, plist::Array());
+}
+
+}  // namespace
+
+void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
+  const plist::Dictionary message = event.dictionary();
+  const auto operation = message.number("operation");
+  if (!operation) return;
+  if (operation->int32() == kDeliver) {
+    deliver(platform, message.array("app_data"));
+    return;
+  }
+  if (platform.state.clientRequestHandled) return;
+  platform.state.clientRequestHandled = true;
+  switch (operation->int32()) {
+    case kAnnounce:
+      announce(platform);
+      break;
+    case kForceDay:
+      forceDay(platform, message);
+      break;
+    default:
+      break;
+  }
+}
+
+std::unique_ptr<ServiceListener> startAppInfoListener(Platform& platform) {
+  auto listener = platform.namedServices.createListener(kAppInfoServiceName);
+  if (!listener) return nullptr;
+  listener->setPeerHandler([&platform](PeerConnection& peer) {
+    peer.setEventHandler(
+        [&platform](const plist::Value& event) { handleAppInfoMessage(platform, event); });
+    peer.resume();
+  });
+  listener->resume();
+  return listener;
+}
+
+}  // namespace tavrel

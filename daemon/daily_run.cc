@@ -1,0 +1,39 @@
+#include "daemon/daily_run.h"
+
+#include "base/arithmetic.h"
+#include "daemon/tasking.h"
+#include "report/bh_report.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
+
+}  // namespace
+
+void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo) {
+  const std::int32_t yesterday = previousDay(platform.statistics.BHDaysSince1970());
+  const std::int32_t lastRunDay =
+      lowInt32(platform.preferences.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain));
+  if (lastRunDay >= yesterday) {
+    platform.log.log(LogLevel::Default, "Day unchanged since last run");
+    return;
+  }
+  dailyTasksForDay(platform, yesterday, appInfo);
+  platform.preferences.ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
+  platform.preferences.ZTXPreferencesSynchronize(kTavrelDomain);
+}
+
+void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo) {
+  platform.log.log(LogLevel::Default, "daily tasks for day %d", day);
+  platform.statistics.BHClientCheckpoint();
+  if (platform.submission.isDiagnosticSubmissionEnabled()) {
+    BHReport(platform).writeLogForYesterday(day, appInfo);
+  }
+  // The place of the daily storage statistics run.
+  platform.crashReporting.FLDumpAllOldStructuredDataLogs();
+  trackOSChangeAndTasking(platform);
+  platform.crashReporting.rollNorvaneCareLogs();
+}
+
+}  // namespace tavrel

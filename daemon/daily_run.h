@@ -1,0 +1,18 @@
+// The daily run: the day's tasks in their fixed order, at most once per calendar day.
+#pragma once
+
+#include <cstdint>
+
+#include "base/plist.h"
+#include "platform/platform.h"
+
+namespace tavrel {
+
+/// The gated run: does yesterday's tasks unless they are done, and remembers the day. `appInfo` is
+/// the list of activated applications, an empty handle when there is none.
+void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo);
+
+/// The tasks for one day, without the gate. No task's failure stops the ones behind it.
+void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo);
+
+}  // namespace tavrel

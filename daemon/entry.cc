@@ -1,0 +1,64 @@
+#include "daemon/entry.h"
+
+#include <cstdint>
+#include <string_view>
+
+#include "base/arithmetic.h"
+#include "daemon/app_info_listener.h"
+#include "daemon/daily_run.h"
+
+namespace tavrel {
+namespace {
+
+// True when the wait ended because nothing happened, false when the system ended it.
+bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {
+  while (true) {
+    switch (loop.runSlice(idleSlice)) {
+      case EventLoop::Slice::HandledEvent:
+        break;
+      case EventLoop::Slice::TimedOut:
+        return true;
+      case EventLoop::Slice::Terminated:
+        return false;
+    }
+  }
+}
+
+void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
+  const auto listener = startAppInfoListener(platform);
+  if (!waitUntilIdle(platform.eventLoop, idleSlice)) return;
+  if (!platform.state.appInfoRequested) return;
+  platform.log.log(LogLevel::Default, "never received requested AAI, so moving along without it");
+  runDailyIfNeeded(platform, plist::Array());
+}
+
+void runArgument(Platform& platform, const char* argument) {
+  const std::int32_t today = platform.statistics.BHDaysSince1970();
+  const std::string_view mode = argument;
+  const plist::Array noAppInfo;
+  if (mode == "-d") {
+    runDailyIfNeeded(platform, noAppInfo);
+  } else if (mode == "-f") {
+    dailyTasksForDay(platform, previousDay(today), noAppInfo);
+  } else if (mode == "-t") {
+    dailyTasksForDay(platform, today, noAppInfo);
+  } else {
+    platform.log.log(LogLevel::Default, "Unknown arg: %s", argument);
+  }
+}
+
+}  // namespace
+
+int runTavrel(Platform& platform, std::span<const char* const> arguments,
+              std::chrono::milliseconds idleSlice) {
+  platform.log.log(LogLevel::Default, "tavrel started");
+  if (arguments.size() == 1) {
+    serve(platform, idleSlice);
+  } else if (arguments.size() >= 2) {
+    runArgument(platform, arguments[1]);
+  }
+  platform.log.log(LogLevel::Default, "tavrel ended");
+  return 0;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,20 @@
+// The entry point behind main: what the command line asks for.
+#pragma once
+
+#include <chrono>
+#include <span>
+
+#include "platform/platform.h"
+
+namespace tavrel {
+
+/// How long the service waits for an event before it ends.
+inline constexpr std::chrono::milliseconds kIdleSlice{10'000};
+
+/// Runs the process. `arguments` begins with the program's name. Without an argument it serves
+/// clients until one slice has passed without an event; "-d" is the gated daily run, "-f" and
+/// "-t" force the tasks of yesterday and today. The exit status is always 0.
+int runTavrel(Platform& platform, std::span<const char* const> arguments,
+              std::chrono::milliseconds idleSlice = kIdleSlice);
+
+}  // namespace tavrel

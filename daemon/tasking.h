@@ -1,0 +1,16 @@
+// Tracking of OS updates, and remote tasking: preference settings that another component schedules
+// and that are undone when the tasking or the OS changes.
+#pragma once
+
+#include "platform/platform.h"
+
+namespace tavrel {
+
+/// Notes an OS update, applies a changed tasking, and submits logs at once for a number of days
+/// after an OS update.
+///
+/// The daemon's own domain, which remembers what was applied, is synchronised behind all others:
+/// a run that is cut short is repeated as a whole by the next one.
+void trackOSChangeAndTasking(Platform& platform);
+
+}  // namespace tavrel

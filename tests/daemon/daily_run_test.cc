@@ -1,0 +1,144 @@
+#include "daemon/daily_run.h"
+
+#include <gtest/gtest.h>
+#include <limits>
+
+#include "daemon/entry.h"
+#include "report/bh_report.h"
+#include "tests/fakes/fake_platform.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Dictionary;
+using Messages = std::vector<std::string>;
+using std::chrono_literals::operator""ms;
+
+constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
+
+const fakes::Journal kTasks{"checkpoint", "clean structured logs", "roll support log"};
+const fakes::Journal kGatedTasks{"checkpoint", "clean structured logs", "roll support log",
+                                 "set com.norvane.tallied.tavrel " + std::string(kDayKey),
+                                 "synchronize com.norvane.tallied.tavrel"};
+
+struct DailyRunTest : ::testing::Test {
+  fakes::FakePlatform fake;
+
+  DailyRunTest() {
+    fake.submission.enabled = false;
+    fake.systemVersion.version = {};
+  }
+
+  plist::Value storedDay() { return fake.preferences.domain(kTavrelDomain).get(kDayKey); }
+
+  void run(std::vector<const char*> arguments) {
+    fake.log.entries.clear();
+    fake.journal.clear();
+    EXPECT_EQ(runTavrel(fake.platform, arguments, 5ms), 0);
+  }
+};
+
+TEST_F(DailyRunTest, RunsOncePerDay) {
+  runDailyIfNeeded(fake.platform, {});
+  EXPECT_EQ(fake.journal, kGatedTasks);
+  EXPECT_EQ(storedDay(), plist::Value(19999));
+  EXPECT_EQ(fake.log.messages(), Messages{"daily tasks for day 19999"});
+
+  fake.journal.clear();
+  runDailyIfNeeded(fake.platform, {});
+  EXPECT_EQ(fake.journal, fakes::Journal{});
+  EXPECT_EQ(fake.log.messages().back(), "Day unchanged since last run");
+}
+
+TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
+  fake.systemVersion.version = {{kProductBuildVersionKey, "21A5"}};
+  dailyTasksForDay(fake.platform, 19999, {});
+  EXPECT_EQ(fake.journal,
+            (fakes::Journal{"checkpoint", "clean structured logs",
+                            "set com.norvane.tallied.tavrel LastOSUpdate", "roll support log"}));
+}
+
+TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
+  const struct {
+    plist::Value stored;
+    std::int32_t today;
+    bool runs;
+  } kCases[] = {
+      {{}, 0, false},  // an absent day reads as 0, later than the day before 1970
+      {{}, 2, true},
+      {-5, 0, true},
+      {20001, 20000, false},
+      {"19999", 20000, true},
+      {std::int64_t{1} << 40, 20000, true},  // the low half is 0
+      {std::numeric_limits<std::int32_t>::max(), 20000, false},
+      {20000, std::numeric_limits<std::int32_t>::min(), true},  // its yesterday is the last day
+  };
+  for (const auto& c : kCases) {
+    fake.preferences.domain(kTavrelDomain).set(kDayKey, c.stored);
+    fake.store.today = c.today;
+    fake.journal.clear();
+    runDailyIfNeeded(fake.platform, {});
+    EXPECT_EQ(!fake.journal.empty(), c.runs) << textOf(c.stored) << " on " << c.today;
+  }
+}
+
+TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
+  fake.store.scalars = {{"k", 19999, 1}};
+  fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
+  dailyTasksForDay(fake.platform, 19999, {});
+  EXPECT_EQ(fake.journal, kTasks);
+  EXPECT_TRUE(fake.answers.questions.empty());  // nor was the whitelist looked at
+
+  fake.submission.enabled = true;
+  fake.journal.clear();
+  const plist::Array apps{Dictionary{{"bundle", "a"}}};
+  dailyTasksForDay(fake.platform, 19999, apps);
+  EXPECT_EQ(fake.journal.front(), "checkpoint");
+  EXPECT_EQ(fake.submission.lastLog().get("BHActivatedAppInfo"), plist::Value(apps));
+  EXPECT_FALSE(storedDay());
+}
+
+TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
+  run({"tavrel", "-d", "-t"});
+  EXPECT_EQ(fake.journal, kGatedTasks);
+  EXPECT_EQ(fake.log.messages(),
+            (Messages{"tavrel started", "daily tasks for day 19999", "tavrel ended"}));
+
+  run({"tavrel", "-f"});
+  EXPECT_EQ(fake.journal, kTasks);
+  run({"tavrel", "-t"});
+  EXPECT_EQ(fake.journal, kTasks);
+  EXPECT_EQ(fake.log.messages()[1], "daily tasks for day 20000");
+
+  for (const char* unknown : {"-D", "", "-x", "-dd", " -d"}) {
+    run({"tavrel", unknown});
+    EXPECT_EQ(fake.journal, fakes::Journal{});
+    EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + unknown);
+  }
+  run({});
+  EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
+}
+
+TEST_F(DailyRunTest, ServesUntilASliceHasPassedWithoutAnEvent) {
+  run({"tavrel"});
+  EXPECT_EQ(fake.eventLoop.slices, std::vector{5ms});
+  EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
+
+  fake.eventLoop.slices.clear();
+  fake.eventLoop.events = {[] {}, [this] { fake.state.appInfoRequested = true; }, [] {}};
+  run({"tavrel"});
+  EXPECT_EQ(fake.eventLoop.slices.size(), 4U);
+  EXPECT_EQ(fake.journal, kGatedTasks);
+  EXPECT_EQ(fake.log.messages()[1], "never received requested AAI, so moving along without it");
+}
+
+TEST_F(DailyRunTest, EndsWithoutAFurtherRunWhenTheSystemSaysSo) {
+  fake.state.appInfoRequested = true;
+  fake.eventLoop.terminates = true;
+  run({"tavrel"});
+  EXPECT_EQ(fake.journal, fakes::Journal{});
+  EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
+}
+
+}  // namespace
+}  // namespace tavrel
