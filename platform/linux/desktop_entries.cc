@@ -1,0 +1,94 @@
+#include "platform/linux/desktop_entries.h"
+
+#include <algorithm>
+#include <filesystem>
+#include <string>
+#include <string_view>
+#include <system_error>
+#include <unordered_set>
+#include <vector>
+
+#include "base/limits.h"
+#include "platform/linux/line_reader.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr std::string_view kApplicationsFolder = "/applications";
+
+struct DataFolder {
+  std::string path;
+  std::string_view bundleType;
+};
+
+std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
+  std::vector<DataFolder> folders;
+  std::error_code error;
+  for (fs::directory_iterator at(root.path("/home"), error), end; !error && at != end;
+       at.increment(error)) {
+    folders.push_back({at->path().string() + "/.local/share", PWUserApplicationType});
+  }
+  std::sort(folders.begin(), folders.end(),
+            [](const DataFolder& a, const DataFolder& b) { return a.path < b.path; });
+  for (const auto path :
+       {"/root/.local/share", "/var/lib/flatpak/exports/share", "/usr/local/share"}) {
+    folders.push_back({root.path(path), PWUserApplicationType});
+  }
+  folders.push_back({root.path("/usr/share"), kSystemApplicationType});
+  return folders;
+}
+
+bool isApplication(const std::string& path) {
+  LineReader lines(path);
+  bool inEntry = false;
+  bool application = false;
+  while (const auto line = lines.next()) {
+    if (line->starts_with('[')) {
+      if (inEntry) break;
+      inEntry = line->starts_with("[Desktop Entry]");
+    }
+    const std::size_t equals = line->find('=');
+    if (!inEntry || line->starts_with('#') || equals == std::string_view::npos) continue;
+    const std::string_view key = line->substr(0, line->find_last_not_of(" \t", equals - 1) + 1);
+    std::string_view value = line->substr(equals + 1);
+    value.remove_prefix(std::min(value.find_first_not_of(" \t"), value.size()));
+    value = value.substr(0, value.find_last_not_of(" \t\r") + 1);
+    if (key == "Type") application = value == "Application";
+    if ((key == "NoDisplay" || key == "Hidden") && value == "true") return false;
+  }
+  return application && lines.errorNumber() == 0;
+}
+
+}  // namespace
+
+void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
+                             const std::function<void(const PWBundleProxy&)>& handler) {
+  std::unordered_set<std::string> seen;
+  for (const DataFolder& folder : dataFolders(root)) {
+    const std::string top = folder.path + std::string(kApplicationsFolder);
+    std::error_code error;
+    fs::recursive_directory_iterator at(top, fs::directory_options::skip_permission_denied, error);
+    for (; !error && at != fs::recursive_directory_iterator(); at.increment(error)) {
+      const std::string path = at->path().string();
+      if (!path.ends_with(".desktop")) continue;
+      std::string identifier = path.substr(top.size() + 1);
+      std::replace(identifier.begin(), identifier.end(), '/', '-');
+      if (seen.contains(identifier)) continue;
+      if (seen.size() == limits::kDesktopEntries) {
+        log.log(LogLevel::Error, "more than %zu desktop entries; those from %s on do not count",
+                limits::kDesktopEntries, path);
+        return;
+      }
+      seen.insert(identifier);
+      if (isApplication(path)) handler({std::move(identifier), folder.bundleType});
+    }
+    if (error && error != std::errc::no_such_file_or_directory &&
+        error != std::errc::not_a_directory) {
+      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, error.message());
+    }
+  }
+}
+
+}  // namespace tavrel

@@ -1,0 +1,59 @@
+// Crash-reporting support on files.
+//
+// Structured records are lines of JSON in
+// /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
+// and day. They are written through to storage together, at the clean-up that ends a day's work or
+// with the process. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/
+// support.log, is rolled to support.log.1 and on to support.log.5.
+#pragma once
+
+#include <set>
+#include <string>
+
+#include "platform/clock.h"
+#include "platform/crash_reporting.h"
+#include "platform/linux/device_root.h"
+#include "platform/linux/file_layer.h"
+#include "platform/linux/linux_system_version.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class FileCrashReporting final : public CrashReporting {
+ public:
+  /// Days for which structured records are kept.
+  static constexpr std::int64_t kDaysKept = 30;
+  /// Rolled support logs that are kept.
+  static constexpr int kSupportLogsKept = 5;
+
+  FileCrashReporting(const DeviceRoot& root, FileLayer& files, LinuxSystemVersion& systemVersion,
+                     Clock& clock, SystemLog& log)
+      : root_(root), files_(files), systemVersion_(systemVersion), clock_(clock), log_(log) {}
+  ~FileCrashReporting() override;
+
+  void FLLogStructuredData(std::uint32_t logType, const plist::Dictionary& record) override;
+  void FLDumpAllOldStructuredDataLogs() override;
+  void rollNorvaneCareLogs() override;
+
+  /// Derived from the machine's identifier, which itself never leaves the device: a UUID that is
+  /// the same at every call; "unknown" on a machine without one.
+  std::string systemIdentifier() override;
+  /// As firmware names it; "unknown" when it does not.
+  std::string hardwareModel() override;
+  std::string osVersion() override;
+  std::string incidentIdentifier() override;
+
+ private:
+  void flushRecords();
+  std::string fact(std::string_view devicePath);
+
+  const DeviceRoot& root_;
+  FileLayer& files_;
+  LinuxSystemVersion& systemVersion_;
+  Clock& clock_;
+  SystemLog& log_;
+  std::set<std::string> unflushed_;
+  std::set<std::string> refused_;  // files whose failure has been told
+};
+
+}  // namespace tavrel

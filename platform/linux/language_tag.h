@@ -1,0 +1,28 @@
+// Languages, as tags ("sr-Latn-RS") and as names of locales ("sr_RS.UTF-8@latin").
+#pragma once
+
+#include <optional>
+#include <string>
+#include <string_view>
+
+namespace tavrel {
+
+struct LanguageTag {
+  std::string language;  // "sr"
+  std::string script;    // "Latn", empty when not given
+  std::string region;    // "RS" or "419", empty when not given
+  std::string variant;   // "valencia", empty when not given
+
+  std::string text() const;
+  /// The script that the language is written in in that region when none is given.
+  std::string_view effectiveScript() const;
+
+  friend bool operator==(const LanguageTag&, const LanguageTag&) = default;
+};
+
+/// Reads either form, in any case. The encoding of a locale name does not matter, its modifier
+/// gives the script or the variant when it stands for one. Nothing for "C", "POSIX" and whatever is
+/// no name of a language.
+std::optional<LanguageTag> parseLanguageTag(std::string_view name);
+
+}  // namespace tavrel

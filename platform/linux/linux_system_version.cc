@@ -1,0 +1,114 @@
+#include "platform/linux/linux_system_version.h"
+
+#include <sys/utsname.h>
+
+#include "base/limits.h"
+#include "platform/linux/property_list_file.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kVersionFile = "/etc/tavrel/system-version.plist";
+constexpr std::string_view kOsReleaseFiles[] = {"/etc/os-release", "/usr/lib/os-release"};
+
+/// A value as the shell would read it.
+std::string unquoted(std::string_view text) {
+  std::string value;
+  char quote = 0;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    const char c = text[i];
+    if (quote == 0 && (c == '"' || c == '\'')) {
+      quote = c;
+    } else if (c == quote && quote != 0) {
+      quote = 0;
+    } else if (c == '\\' && quote != '\'' && i + 1 < text.size()) {
+      value += text[++i];
+    } else {
+      value += c;
+    }
+  }
+  return value;
+}
+
+std::string_view trimmed(std::string_view line) {
+  constexpr std::string_view kBlank = " \t\r";
+  const std::size_t first = line.find_first_not_of(kBlank);
+  if (first == std::string_view::npos) return {};
+  return line.substr(first, line.find_last_not_of(kBlank) - first + 1);
+}
+
+}  // namespace
+
+std::optional<std::string> osReleaseValue(std::string_view text, std::string_view name) {
+  std::optional<std::string> value;
+  while (!text.empty()) {
+    const std::size_t end = text.find('\n');
+    const std::string_view line = trimmed(text.substr(0, end));
+    text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
+    if (line.starts_with(name) && line.size() > name.size() && line[name.size()] == '=') {
+      value = unquoted(line.substr(name.size() + 1));
+    }
+  }
+  return value;
+}
+
+plist::Dictionary LinuxSystemVersion::systemVersionDictionary() {
+  return plist::mutableCopy(known());
+}
+
+std::string LinuxSystemVersion::text() {
+  const auto version = known();
+  std::string text(version.string(kProductNameKey).value_or(""));
+  if (const auto number = version.string(kProductVersionKey)) {
+    if (!text.empty()) text += ' ';
+    text += *number;
+  }
+  if (const auto build = version.string(kProductBuildVersionKey)) {
+    if (!text.empty()) text += ' ';
+    text += '(';
+    text += *build;
+    text += ')';
+  }
+  return text.empty() ? "unknown" : text;
+}
+
+const plist::Dictionary& LinuxSystemVersion::known() {
+  if (known_) return known_;
+  known_ = readDictionaryFile(files_, propertyLists_, log_, root_.path(kVersionFile));
+  if (!known_) known_ = fromOsRelease();
+  return known_;
+}
+
+plist::Dictionary LinuxSystemVersion::fromOsRelease() {
+  std::optional<std::string> text;
+  for (const bool below : {true, false}) {
+    for (const std::string_view file : kOsReleaseFiles) {
+      const std::string path = below ? root_.path(file) : std::string(file);
+      auto content = files_.readIfPresent(path, limits::kSystemFactBytes);
+      if (!content) {
+        log_.write(LogLevel::Error, content.error().message);
+      } else if (*content) {
+        text = *std::move(*content);
+        break;
+      }
+    }
+    if (text) break;
+  }
+
+  auto version = plist::Dictionary::create();
+  const std::string_view release = text ? std::string_view(*text) : std::string_view();
+  if (const auto name = osReleaseValue(release, "NAME")) version.set(kProductNameKey, *name);
+  const auto number = osReleaseValue(release, "VERSION_ID");
+  if (number) version.set(kProductVersionKey, *number);
+
+  // A system without builds of its own counts each kernel as one.
+  auto build = osReleaseValue(release, "BUILD_ID");
+  utsname kernel{};
+  if (!build && uname(&kernel) == 0) {
+    build = number ? *number + "-" + kernel.release : std::string(kernel.release);
+  }
+  if (build) version.set(kProductBuildVersionKey, *build);
+  return version;
+}
+
+}  // namespace tavrel

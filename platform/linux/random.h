@@ -1,0 +1,23 @@
+// Random bytes, for names and identifiers that must not meet.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <string>
+
+#include "base/bytes.h"
+
+namespace tavrel {
+
+void fillRandom(MutableByteSpan bytes);
+
+/// Eight random bytes as 16 hexadecimal digits.
+std::string randomName();
+
+/// 16 bytes as the text of a UUID, in capitals.
+std::string uuidText(const std::array<std::byte, 16>& bytes);
+
+/// The text of a new random UUID (version 4).
+std::string randomUuidText();
+
+}  // namespace tavrel

@@ -1,0 +1,165 @@
+#include "platform/linux/socket_listener.h"
+
+#include <cerrno>
+#include <cstring>
+#include <unistd.h>
+#include <utility>
+#include <variant>
+
+#include "base/limits.h"
+#include "platform/linux/service_message.h"
+
+namespace tavrel {
+
+RefusalLog::~RefusalLog() {
+  sayLeftOut();
+}
+
+void RefusalLog::sayLeftOut() {
+  if (leftOut_ > 0) log_.log(LogLevel::Default, "%d more refusals were not logged", leftOut_);
+  leftOut_ = 0;
+}
+
+void RefusalLog::write(std::string_view line) {
+  const auto now = std::chrono::steady_clock::now();
+  if (now - minuteBegan_ >= std::chrono::minutes(1)) {
+    sayLeftOut();
+    minuteBegan_ = now;
+    written_ = 0;
+  }
+  if (written_ == limits::kRefusalLinesPerMinute) {
+    ++leftOut_;
+    return;
+  }
+  ++written_;
+  log_.write(LogLevel::Default, line);
+}
+
+class SocketListener::Peer final : public PeerConnection {
+ public:
+  Peer(SocketListener& listener, std::uint64_t id, Descriptor socket, const ucred& user)
+      : listener_(listener), id_(id), user_(user), socket_(std::move(socket)) {}
+
+  void setEventHandler(EventHandler handler) override { handler_ = std::move(handler); }
+
+  void resume() override {
+    if (source_) return;
+    auto source = listener_.loop_.watch(socket_.get(), [this] { return receive(); });
+    hasFailed_ = !source;
+    if (source) {
+      source_ = *std::move(source);
+    } else {
+      listener_.refusals_.write(dropped(source.error().message));
+    }
+  }
+
+  bool hasFailed() const { return hasFailed_; }
+
+ private:
+  /// May destroy the peer.
+  Activity receive() {
+    Received received = receiveMessage(
+        socket_.get(), MutableByteSpan(listener_.buffer_.get(), limits::kPacketBytes));
+    if (std::holds_alternative<NoMessage>(received)) return Activity::Nothing;
+    if (const auto* message = std::get_if<plist::Dictionary>(&received)) {
+      listener_.silentInARow_ = 0;
+      hasSent_ = true;
+      if (handler_) handler_(*message);
+      return Activity::Event;
+    }
+    Activity activity = hasSent_ ? Activity::Event : Activity::Nothing;
+    if (const auto* error = std::get_if<Error>(&received)) {
+      listener_.refusals_.write(dropped(error->message));
+      activity = Activity::Nothing;
+    }
+    if (handler_) handler_(plist::Value());
+    listener_.release(id_);
+    return activity;
+  }
+
+  std::string dropped(std::string_view why) const {
+    return format("%s: dropped peer %d (user %u): %s", listener_.name_, user_.pid, user_.uid, why);
+  }
+
+  SocketListener& listener_;
+  std::uint64_t id_;
+  ucred user_;
+  EventHandler handler_;
+  bool hasSent_ = false;
+  bool hasFailed_ = false;
+  Descriptor socket_;
+  LinuxEventLoop::Source source_;  // ends before its descriptor
+};
+
+SocketListener::SocketListener(std::string name, ServiceSocket socket, LinuxEventLoop& loop,
+                               SystemLog& log)
+    : name_(std::move(name)),
+      loop_(loop),
+      log_(log),
+      refusals_(log),
+      socket_(std::move(socket)),
+      buffer_(std::make_unique_for_overwrite<std::byte[]>(limits::kPacketBytes)) {}
+
+SocketListener::~SocketListener() = default;
+
+void SocketListener::resume() {
+  if (source_) return;
+  auto source = loop_.watch(socket_.get(), [this] { return acceptPeer(); });
+  if (source) {
+    source_ = *std::move(source);
+  } else {
+    log_.log(LogLevel::Error, "%s: %s", name_, source.error().message);
+  }
+}
+
+void SocketListener::pause(std::string_view why) {
+  source_.stop();
+  paused_ = true;
+  refusals_.write(format("%s: new peers wait until one leaves: %s", name_, why));
+}
+
+bool SocketListener::admits(const ucred& user) {
+  const uid_t own = geteuid();
+  if (user.uid == 0 || user.uid == own) return true;
+  refusals_.write(format("%s: refused peer %d (user %u): only root and user %u may use the service",
+                         name_, user.pid, user.uid, own));
+  return false;
+}
+
+LinuxEventLoop::Activity SocketListener::acceptPeer() {
+  Descriptor socket(accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
+  if (!socket) {
+    if (errno == EMFILE || errno == ENFILE || errno == ENOBUFS || errno == ENOMEM) {
+      pause(std::strerror(errno));
+    }
+    return Activity::Nothing;
+  }
+  ucred user{};
+  socklen_t size = sizeof user;
+  if (getsockopt(socket.get(), SOL_SOCKET, SO_PEERCRED, &user, &size) != 0 || !admits(user)) {
+    return Activity::Nothing;
+  }
+
+  const std::uint64_t id = ++lastPeerId_;
+  const auto& peer =
+      peers_.emplace(id, std::make_unique<Peer>(*this, id, std::move(socket), user)).first->second;
+  if (peers_.size() == limits::kServicePeers) {
+    pause(format("there are %llu", std::uint64_t{peers_.size()}));
+  }
+  if (peerHandler_) peerHandler_(*peer);
+  if (peer->hasFailed()) {
+    release(id);
+    return Activity::Nothing;
+  }
+  if (silentInARow_ == limits::kSilentConnections) return Activity::Nothing;
+  ++silentInARow_;
+  return Activity::Event;
+}
+
+void SocketListener::release(std::uint64_t peerId) {
+  peers_.erase(peerId);
+  if (!std::exchange(paused_, false)) return;
+  resume();
+}
+
+}  // namespace tavrel

@@ -1,0 +1,195 @@
+#include "platform/linux/sqlite_connection.h"
+
+#include <cstring>
+#include <sqlite3.h>
+#include <utility>
+
+namespace tavrel {
+namespace {
+
+struct Explanation {
+  StoreFault fault;
+  const char* advice;
+};
+
+Explanation explain(int code) {
+  switch (code & 0xFF) {
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+      return {StoreFault::Damaged, "the file has to be set aside"};
+    case SQLITE_BUSY:
+    case SQLITE_LOCKED:
+    case SQLITE_PROTOCOL:
+      return {StoreFault::Busy, "try again when the process that holds it has finished"};
+    case SQLITE_CANTOPEN:
+    case SQLITE_READONLY:
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+      return {StoreFault::Refused, "check owner and permissions of the file and its folder"};
+    case SQLITE_ERROR:
+      return {StoreFault::Foreign, "the tables are not this program's; move the file away"};
+    case SQLITE_FULL:
+      return {StoreFault::Other, "free some space in its file system"};
+    default:
+      return {StoreFault::Other, "check the file system that holds it"};
+  }
+}
+
+[[noreturn]] void throwFailure(sqlite3* connection, int code) {
+  const Explanation explanation = explain(code);
+  std::string message = connection ? sqlite3_errmsg(connection) : sqlite3_errstr(code);
+  const int systemCode = connection ? sqlite3_system_errno(connection) : 0;
+  const bool fromSystem = (code & 0xFF) == SQLITE_CANTOPEN || (code & 0xFF) == SQLITE_IOERR;
+  if (fromSystem && systemCode != 0) {
+    message += " (";
+    message += std::strerror(systemCode);
+    message += ')';
+  }
+  throw StoreFailure{explanation.fault, message + ": " + explanation.advice};
+}
+
+// SQLite's URI form is the only way to ask for an immutable file; in it "%", "?" and "#" have a
+// meaning.
+std::string immutableUri(const std::string& path) {
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  std::string uri = "file:";
+  for (const char character : path) {
+    if (character == '%' || character == '?' || character == '#') {
+      const auto bits = static_cast<unsigned char>(character);
+      uri += '%';
+      uri += kDigits[bits >> 4];
+      uri += kDigits[bits & 0xF];
+    } else {
+      uri += character;
+    }
+  }
+  return uri + "?immutable=1";
+}
+
+}  // namespace
+
+SqliteConnection::SqliteConnection(const std::string& path, Access access, int busyMilliseconds) {
+  int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
+  std::string name = path;
+  switch (access) {
+    case Access::Create:
+      flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+      break;
+    case Access::Read:
+      // A user who may write takes part in the log as a writer does, and so leaves none behind.
+      // SQLite opens a write-protected file for reading.
+      flags |= SQLITE_OPEN_READWRITE;
+      break;
+    case Access::Immutable:
+      flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
+      name = immutableUri(path);
+      break;
+  }
+  const int code = sqlite3_open_v2(name.c_str(), &handle_, flags, nullptr);
+  try {
+    if (code != SQLITE_OK) throwFailure(handle_, code);
+    sqlite3_busy_timeout(handle_, busyMilliseconds);
+    // The file may come from anywhere: nothing that its schema says is to run.
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
+    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512");
+  } catch (...) {
+    sqlite3_close_v2(handle_);
+    throw;
+  }
+}
+
+SqliteConnection::~SqliteConnection() {
+  sqlite3_close_v2(handle_);
+}
+
+SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
+    : handle_(std::exchange(other.handle_, nullptr)) {}
+
+SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
+  std::swap(handle_, other.handle_);
+  return *this;
+}
+
+void SqliteConnection::execute(const char* sql) {
+  const int code = sqlite3_exec(handle_, sql, nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) throwFailure(handle_, code);
+}
+
+std::int64_t SqliteConnection::integer(std::string_view sql) {
+  SqliteStatement statement(*this, sql);
+  return statement.step() ? statement.integer(0) : 0;
+}
+
+bool SqliteConnection::checkpoint() {
+  const int code =
+      sqlite3_wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  if (code == SQLITE_OK) return true;
+  if ((code & 0xFF) == SQLITE_BUSY || (code & 0xFF) == SQLITE_LOCKED) return false;
+  throwFailure(handle_, code);
+}
+
+SqliteStatement::SqliteStatement(const SqliteConnection& connection, std::string_view sql) {
+  const int code = sqlite3_prepare_v2(connection.handle(), sql.data(), static_cast<int>(sql.size()),
+                                      &handle_, nullptr);
+  if (code != SQLITE_OK) throwFailure(connection.handle(), code);
+}
+
+SqliteStatement::~SqliteStatement() {
+  sqlite3_finalize(handle_);
+}
+
+void SqliteStatement::check(int code) const {
+  if (code != SQLITE_OK) throwFailure(sqlite3_db_handle(handle_), code);
+}
+
+void SqliteStatement::bind(int index, std::int64_t value) {
+  check(sqlite3_bind_int64(handle_, index, value));
+}
+
+void SqliteStatement::bind(int index, std::string_view bytes) {
+  // A null address would bind NULL in the place of a blob of no bytes.
+  const char* const data = bytes.data() ? bytes.data() : "";
+  check(sqlite3_bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
+}
+
+void SqliteStatement::bindNull(int index) {
+  check(sqlite3_bind_null(handle_, index));
+}
+
+bool SqliteStatement::step() {
+  const int code = sqlite3_step(handle_);
+  if (code == SQLITE_ROW) return true;
+  if (code == SQLITE_DONE) return false;
+  throwFailure(sqlite3_db_handle(handle_), code);
+}
+
+void SqliteStatement::reset() {
+  // The code of a reset repeats the failure of the step before, which has been told.
+  sqlite3_reset(handle_);
+}
+
+void SqliteStatement::run() {
+  while (step()) {
+  }
+  reset();
+}
+
+bool SqliteStatement::isNull(int column) const {
+  return sqlite3_column_type(handle_, column) == SQLITE_NULL;
+}
+
+std::int64_t SqliteStatement::integer(int column) const {
+  return sqlite3_column_int64(handle_, column);
+}
+
+std::string_view SqliteStatement::bytes(int column) const {
+  const void* const data = sqlite3_column_blob(handle_, column);
+  const int size = sqlite3_column_bytes(handle_, column);
+  return data ? std::string_view(static_cast<const char*>(data), static_cast<std::size_t>(size))
+              : std::string_view();
+}
+
+}  // namespace tavrel

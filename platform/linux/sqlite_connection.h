@@ -1,0 +1,95 @@
+// A thin ownership layer over SQLite for the statistics store.
+//
+// `SqliteConnection` owns a connection, `SqliteStatement` a compiled statement of it; a statement
+// must not outlive its connection. Inside the store every failure is thrown as a `StoreFailure`;
+// the store's public operations catch it, so that it never leaves this folder.
+//
+//   SqliteStatement statement(connection, "SELECT value FROM scalars WHERE day = ?1");
+//   statement.bind(1, day);
+//   while (statement.step()) use(statement.integer(0));
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+struct sqlite3;
+struct sqlite3_stmt;
+
+namespace tavrel {
+
+enum class StoreFault : std::uint8_t {
+  Damaged,  // SQLite finds the file corrupt or no database at all
+  Busy,     // another process held its lock for too long
+  Refused,  // the system does not let this user, or anybody, at the file
+  Foreign,  // a database, but of a schema that this program does not know
+  Other,
+};
+
+/// What failed, why, and what can be done about it; without the store's path.
+struct StoreFailure {
+  StoreFault fault;
+  std::string message;
+};
+
+class SqliteConnection {
+ public:
+  enum class Access : std::uint8_t {
+    Create,     // read and write; an absent file is created
+    Read,       // read; the write-ahead log is taken part in as far as the user may
+    Immutable,  // read a file that nobody writes, without locks and without a log
+  };
+
+  /// `busyMilliseconds`: how long a lock of another process is waited for.
+  SqliteConnection(const std::string& path, Access access, int busyMilliseconds);
+  ~SqliteConnection();
+  SqliteConnection(SqliteConnection&& other) noexcept;
+  SqliteConnection& operator=(SqliteConnection&& other) noexcept;
+
+  /// Runs statements that yield nothing of interest.
+  void execute(const char* sql);
+
+  /// The first column of the first row.
+  std::int64_t integer(std::string_view sql);
+
+  /// Moves the write-ahead log into the database and empties it. False when other processes were
+  /// in the way; as much as possible has then been moved.
+  bool checkpoint();
+
+  sqlite3* handle() const { return handle_; }
+
+ private:
+  sqlite3* handle_ = nullptr;
+};
+
+class SqliteStatement {
+ public:
+  SqliteStatement(const SqliteConnection& connection, std::string_view sql);
+  ~SqliteStatement();
+  SqliteStatement(const SqliteStatement&) = delete;
+  SqliteStatement& operator=(const SqliteStatement&) = delete;
+
+  void bind(int index, std::int64_t value);
+  /// Binds bytes as a blob; they are borrowed until the statement is reset.
+  void bind(int index, std::string_view bytes);
+  void bindNull(int index);
+
+  /// True with a row, false at the end.
+  bool step();
+  /// Makes the statement ready to run again; bindings stay.
+  void reset();
+  /// Runs to the end and makes the statement ready to run again.
+  void run();
+
+  bool isNull(int column) const;
+  std::int64_t integer(int column) const;
+  /// Valid until the next step or reset.
+  std::string_view bytes(int column) const;
+
+ private:
+  void check(int code) const;
+
+  sqlite3_stmt* handle_ = nullptr;
+};
+
+}  // namespace tavrel

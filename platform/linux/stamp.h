@@ -1,0 +1,19 @@
+// Instants in names of files and in lines for people, in UTC.
+#pragma once
+
+#include <string>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// "20261116T180218Z", for names.
+std::string compactStamp(plist::Date instant);
+
+/// "2026-11-16T18:02:18.123Z", milliseconds cut off.
+std::string preciseStamp(plist::Date instant);
+
+/// The UTC day of an instant, in days since 1970-01-01.
+std::int64_t dayOf(plist::Date instant);
+
+}  // namespace tavrel

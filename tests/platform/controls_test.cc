@@ -1,0 +1,146 @@
+#include <cerrno>
+#include <gtest/gtest.h>
+
+#include "base/text.h"
+#include "platform/linux/file_preferences.h"
+#include "platform/linux/linux_clock.h"
+#include "platform/linux/linux_dynamic_loader.h"
+#include "platform/linux/linux_system_controls.h"
+#include "platform/plist/coding.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+using Lines = std::vector<std::string>;
+
+constexpr std::string_view kControls = "/etc/tavrel/system-controls.plist";
+constexpr std::string_view kLibraries = "/etc/tavrel/dynamic-libraries.plist";
+constexpr std::string_view kFaultline =
+    "/System/Library/PrivateFrameworks/FaultlineSupport.framework/FaultlineSupport";
+
+class ControlsTest : public testing::Test {
+ protected:
+  void writeList(std::string_view path, const plist::Value& value) {
+    const auto document = coding.encodeXml(value);
+    ASSERT_TRUE(document) << document.error().message;
+    device.write(path, *document);
+  }
+
+  TemporaryRoot device;
+  KeptLog log;
+  FileLayer files;
+  plist::PlistCoding coding;
+};
+
+TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
+  const std::byte bytes[] = {std::byte{1}, std::byte{2}, std::byte{3}};
+  writeList(kControls, plist::Dictionary{
+                           {"bytes", plist::Data(bytes)},
+                           {"twelve", 12},
+                           {"all ones", 4294967295},
+                           {"minus two", -2},
+                           {"fails", plist::Dictionary{{"errno", EPERM}}},
+                           {"no errno", plist::Dictionary{{"errno", 0}}},
+                           {"real", 1.5},
+                           {"vm.swapusage", 7},
+                       });
+  struct Case {
+    const char* name;
+    std::size_t size;
+    int errorNumber;
+    const char* content;  // hexadecimal, of the whole buffer
+  };
+  static constexpr Case kCases[] = {
+      {"bytes", 4, 0, "010203ee"},
+      {"bytes", 3, 0, "010203"},
+      {"bytes", 2, ENOMEM, "eeee"},
+      {"twelve", 4, 0, "0c000000"},
+      {"twelve", 8, 0, "0c00000000000000"},
+      {"twelve", 1, 0, "0c"},
+      {"twelve", 0, ENOMEM, ""},
+      {"all ones", 4, 0, "ffffffff"},
+      {"all ones", 8, 0, "ffffffff00000000"},
+      {"all ones", 3, ENOMEM, "eeeeee"},
+      {"minus two", 1, 0, "fe"},
+      {"minus two", 9, 0, "feffffffffffffffff"},
+      {"fails", 4, EPERM, "eeeeeeee"},
+      {"no errno", 4, EINVAL, "eeeeeeee"},
+      {"real", 4, EINVAL, "eeeeeeee"},
+      {"vm.swapusage", 16, 0, "07000000000000000000000000000000"},
+      {"kern.memorystatus_thaw_count", 4, ENOENT, "eeeeeeee"},
+  };
+  LinuxSystemControls controls(device.root, files, coding, log);
+  for (const Case& row : kCases) {
+    std::vector<std::byte> buffer(row.size, std::byte{0xee});
+    const auto result = controls.read(row.name, buffer);
+    EXPECT_EQ(result.errorNumber, row.errorNumber) << row.name << ' ' << row.size;
+    std::string content;
+    appendHex(content, buffer);
+    EXPECT_EQ(content, row.content) << row.name << ' ' << row.size;
+  }
+  const std::string path = device.root.path(kControls);
+  const auto line = [&](const std::string& name) {
+    return path + ": the value of " + name +
+           " is neither bytes nor an integer nor {\"errno\": NUMBER}";
+  };
+  EXPECT_EQ(log.lines, (Lines{line("no errno"), line("real")}));
+}
+
+TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
+  device.write(kControls, "<plist>");  // a file that cannot be used hides nothing
+  std::uint64_t kibibytes = 0;
+  std::ifstream meminfo("/proc/meminfo");
+  for (std::string word; meminfo >> word;) {
+    if (word == "SwapTotal:") meminfo >> kibibytes;
+  }
+  LinuxSystemControls controls(device.root, files, coding, log);
+  std::array<std::byte, kSwapUsageBytes> record{};
+  const auto result = controls.read("vm.swapusage", record);
+  EXPECT_EQ(result.errorNumber, 0);
+  EXPECT_EQ(result.length, kSwapUsageBytes);
+  EXPECT_EQ(loadLittle64(record, 0), kibibytes * 1024);
+  EXPECT_EQ(loadLittle64(record, 8).value() + loadLittle64(record, 16).value(), kibibytes * 1024);
+  std::array<std::byte, 31> tooSmall{};
+  EXPECT_EQ(controls.read("vm.swapusage", tooSmall).errorNumber, ENOMEM);
+  EXPECT_EQ(log.lines.size(), 1U);  // read once
+
+  std::string bytes;
+  appendHex(bytes, swapUsageRecord(0x1122334455, 0x1022334455, 4096));
+  EXPECT_EQ(bytes,
+            "5544332211000000"
+            "5544332210000000"
+            "0000000001000000"
+            "0010000000000000");
+  EXPECT_EQ(loadLittle64(swapUsageRecord(1, 2, 4096), 16), 0U);
+}
+
+TEST_F(ControlsTest, OffersFunctionsUntilTheyAreTakenAway) {
+  LinuxClock clock;
+  FilePreferences preferences(device.root, files, coding, clock, log);
+  LinuxDynamicLoader loader(device.root, files, coding, log, preferences);
+  EXPECT_EQ(loader.load("/usr/lib/libc.so.6"), nullptr);
+
+  const auto library = loader.load(kFaultline);
+  ASSERT_NE(library, nullptr);
+  EXPECT_TRUE(std::holds_alternative<std::monostate>(library->find("abort")));
+  const auto set = std::get<PreferenceSetter>(library->find("ZTXPreferencesSetValue"));
+  const auto get =
+      std::get<IntegerPreferenceGetter>(library->find("ZTXPreferencesGetIntegerValue"));
+  set("Count", 3, "com.norvane.tallied");
+  EXPECT_EQ(get("Count", "com.norvane.tallied"), 3);
+  EXPECT_EQ(get("Other", "com.norvane.tallied"), 0);
+
+  writeList(kLibraries,
+            plist::Dictionary{{std::string(kFaultline), plist::Array{"ZTXPreferencesSetValue"}}});
+  const auto partial = loader.load(kFaultline);
+  ASSERT_NE(partial, nullptr);
+  EXPECT_EQ(partial->find("ZTXPreferencesSetValue").index(), 0U);
+  EXPECT_EQ(partial->find("ZTXPreferencesGetIntegerValue").index(), 1U);
+  writeList(kLibraries, plist::Dictionary{{std::string(kFaultline), false}});
+  EXPECT_EQ(loader.load(kFaultline), nullptr);
+  EXPECT_EQ(log.lines, Lines{});
+}
+
+}  // namespace
+}  // namespace tavrel

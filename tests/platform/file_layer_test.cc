@@ -1,0 +1,148 @@
+#include "platform/linux/file_layer.h"
+
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "base/limits.h"
+#include "faulty_file_layer.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+std::string messageOf(const auto& outcome) {
+  return outcome ? "" : outcome.error().message;
+}
+
+TEST(FileLayer, ReadsRegularFilesOnlyAndUpToTheLimit) {
+  const TemporaryRoot device;
+  const auto at = [&](std::string_view path) { return device.root.path(path); };
+  FileLayer files;
+  device.write("/full", std::string(5000, 'x'));
+  device.write("/empty", "");
+  fs::create_directory(at("/folder"));
+  ASSERT_EQ(mkfifo(at("/fifo").c_str(), 0600), 0);
+  fs::create_symlink("/dev/zero", at("/device"));
+
+  EXPECT_EQ(*files.read(at("/full"), 5000), std::string(5000, 'x'));
+  EXPECT_EQ(*files.read(at("/empty"), 0), "");
+  EXPECT_GT(files.read("/proc/self/status", 1U << 20)->size(), 100U);
+  EXPECT_EQ(*files.readIfPresent(at("/none"), 10), std::nullopt);
+  EXPECT_EQ(*files.readIfPresent(at("/full/below"), 10), std::nullopt);
+
+  const struct {
+    std::string_view path;
+    std::string_view reason;
+  } kRefused[] = {
+      {"/full", ": it has more than 4999 bytes; move it away"},
+      {"/folder", ": it is a folder; move it away"},
+      {"/fifo", ": it is not a regular file; move it away"},
+      {"/device", ": it is not a regular file; move it away"},
+  };
+  for (const auto& [path, reason] : kRefused) {
+    EXPECT_EQ(messageOf(files.read(at(path), 4999)),
+              "cannot use " + at(path) + std::string(reason));
+  }
+  EXPECT_EQ(messageOf(files.read(at("/none"), 1)),
+            "cannot read " + at("/none") + ": No such file or directory");
+  EXPECT_NE(messageOf(files.read("/proc/self/status", 10)), "") << "a size that is not told ahead";
+}
+
+TEST(FileLayer, ReplacesWholeFilesAndKeepsTheirMode) {
+  const TemporaryRoot device;
+  FileLayer files;
+  const std::string path = device.root.path("/a/b/file");
+  ASSERT_TRUE(files.replace(path, asBytes("one"), 0640));
+  EXPECT_EQ(FileLayer::status(path)->st_mode & 0777U, 0640U);
+  ASSERT_EQ(chmod(path.c_str(), 0604), 0);
+  ASSERT_TRUE(files.replace(path, asBytes("two"), 0640));
+  EXPECT_EQ(FileLayer::status(path)->st_mode & 0777U, 0604U);
+  {
+    auto abandoned = files.create(path, 0640);
+    ASSERT_TRUE(abandoned);
+    ASSERT_TRUE(abandoned->write(asBytes("three")));
+  }
+  EXPECT_EQ(*files.read(path, 10), "two");
+  EXPECT_EQ(std::distance(fs::directory_iterator(device.root.path("/a/b")), {}), 1);
+
+  fs::create_directory(device.root.path("/folder"));
+  EXPECT_EQ(messageOf(files.replace(device.root.path("/folder"), asBytes("x"), 0644)),
+            "cannot put in place " + device.root.path("/folder") + ": Is a directory");
+  EXPECT_EQ(messageOf(files.replace(path + "/below", asBytes("x"), 0644)),
+            "cannot write " + path + "/below: Not a directory");
+}
+
+TEST(FileLayer, RemovesTemporaryFilesOnceTheyAreOld) {
+  const TemporaryRoot device;
+  const auto now = fs::file_time_type::clock::now();
+  const struct {
+    const char* name;
+    int hours;
+    bool stays;
+  } kFiles[] = {{"/d/.tavrel-0000000000000001.tmp", 25, false},
+                {"/d/.tavrel-0000000000000002.tmp", 23, true},
+                {"/d/.tavrel-0000000000000003.tmp", -25, false},  // the clock was set back
+                {"/d/.other-0000000000000004.tmp", 25, true},
+                {"/d/tavrel-0000000000000005.tmp", 25, true}};
+  for (const auto& file : kFiles) {
+    device.write(file.name, "x");
+    fs::last_write_time(device.root.path(file.name), now - std::chrono::hours(file.hours));
+  }
+  FileLayer files;
+  ASSERT_TRUE(files.replace(device.root.path("/d/file"), asBytes("x"), 0644));
+  for (const auto& file : kFiles) {
+    EXPECT_EQ(fs::exists(device.root.path(file.name)), file.stays) << file.name;
+  }
+}
+
+TEST(FileLayer, AppendsWholeLines) {
+  const TemporaryRoot device;
+  FileLayer files;
+  const std::string path = device.root.path("/logs/lines");
+  ASSERT_TRUE(files.append(path, asBytes("one\n"), 0640, 100));
+  ASSERT_TRUE(files.append(path, asBytes("tw"), 0640, 100));  // as a cut leaves it
+  ASSERT_TRUE(files.append(path, asBytes("three\n"), 0640, 100));
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n");
+  EXPECT_EQ(messageOf(files.append(path, asBytes("four\n"), 0640, 18)),
+            "cannot append to " + path + ": it may have 18 bytes");
+
+  FaultyFileLayer full(device.root.path("/"), FaultyFileLayer::Fault::Failure, 2);
+  EXPECT_EQ(messageOf(full.append(path, asBytes("five\n"), 0640, 100)),
+            "cannot write " + path + ": No space left on device; free some space");
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n");
+}
+
+TEST(FileLayer, AReplacedFileIsOldOrNewAfterEveryFault) {
+  for (const auto fault : FaultyFileLayer::kFaults) {
+    int call = 1;
+    for (bool struck = true; struck; ++call) {
+      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
+      const TemporaryRoot device;
+      device.write("/kept/file", "old");
+      FaultyFileLayer faulty(device.root.path("/"), fault, call);
+      const std::string inOld = device.root.path("/kept/file");
+      const std::string inNew = device.root.path("/new/folder/file");
+      const bool oldDone = static_cast<bool>(faulty.replace(inOld, asBytes("content"), 0644));
+      const bool newDone = static_cast<bool>(faulty.replace(inNew, asBytes("content"), 0644));
+      struck = faulty.hasStruck();
+      faulty.settle();
+
+      QuickFileLayer files;
+      const std::string kept = *files.read(inOld, 100);
+      EXPECT_TRUE(kept == "content" || (!oldDone && kept == "old")) << kept;
+      const auto made = *files.readIfPresent(inNew, 100);
+      EXPECT_TRUE(made == "content" || (!newDone && !made)) << made.value_or("(none)");
+      EXPECT_TRUE(files.replace(inNew, asBytes("again"), 0644));
+      EXPECT_EQ(*files.read(inNew, 100), "again");
+      ASSERT_LT(call, 100);
+    }
+    EXPECT_GT(call, 10) << "the sequence is not that short";
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,250 @@
+#include <cmath>
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <limits>
+#include <memory>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include "base/limits.h"
+#include "base/text.h"
+#include "faulty_file_layer.h"
+#include "platform/linux/file_preferences.h"
+#include "platform/linux/json_line.h"
+#include "platform/linux/linux_clock.h"
+#include "platform/plist/coding.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr std::string_view kDomain = "com.example.domain";
+constexpr std::string_view kFile = "/var/mobile/Library/Preferences/com.example.domain.plist";
+
+/// One process's view of a device's preferences.
+struct Process {
+  Process(const DeviceRoot& root, FileLayer& layer)
+      : preferences(std::make_unique<FilePreferences>(root, layer, propertyLists, clock, log)) {}
+  explicit Process(const DeviceRoot& root) : Process(root, ownFiles) {}
+
+  std::string get(std::string_view key) {
+    return textOf(preferences->ZTXPreferencesGetValue(key, kDomain));
+  }
+  void set(std::string_view key, const plist::Value& value) {
+    preferences->ZTXPreferencesSetValue(key, value, kDomain);
+  }
+  bool synchronize() { return preferences->ZTXPreferencesSynchronize(kDomain); }
+  std::string all() {
+    std::string text;
+    appendJson(text, preferences->values(kDomain));
+    return text;
+  }
+
+  QuickFileLayer ownFiles;
+  plist::PlistCoding propertyLists;
+  LinuxClock clock;
+  KeptLog log;
+  std::unique_ptr<FilePreferences> preferences;
+};
+
+TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
+  const TemporaryRoot device;
+  Process here(device.root), there(device.root);
+  EXPECT_EQ(here.get("a"), "(null)");
+  const plist::Array list{1, 2};
+  here.set("a", list);
+  plist::Array(list).append(3);  // the caller's own, before and after
+  here.preferences->ZTXPreferencesGetValue("a", kDomain).array().append(4);
+  EXPECT_EQ(here.get("a"), "[1, 2]");
+  EXPECT_EQ(there.get("a"), "(null)");
+  EXPECT_TRUE(here.synchronize());
+  EXPECT_EQ(there.get("a"), "(null)") << "until it takes in what others wrote";
+  EXPECT_TRUE(there.synchronize());
+  EXPECT_EQ(there.get("a"), "[1, 2]");
+
+  // Both write, each keeps the other's keys; removing is a change like others.
+  here.set("b", true);
+  there.set("c", "text");
+  there.set("a", {});
+  EXPECT_TRUE(here.synchronize());
+  EXPECT_TRUE(there.synchronize());
+  EXPECT_EQ(there.all(), R"({"b":true,"c":"text"})");
+
+  const auto written = fs::last_write_time(device.root.path(kFile));
+  there.set("b", true);
+  EXPECT_TRUE(there.synchronize());
+  EXPECT_EQ(fs::last_write_time(device.root.path(kFile)), written) << "equal content, no write";
+
+  here.set("d", std::int64_t{-5});
+  here.preferences.reset();
+  Process later(device.root);
+  EXPECT_EQ(later.preferences->ZTXPreferencesGetIntegerValue("d", kDomain), -5);
+  EXPECT_EQ(*later.preferences->domains(), std::vector<std::string>{std::string(kDomain)});
+  EXPECT_TRUE(here.log.lines.empty() && there.log.lines.empty());
+}
+
+TEST(Preferences, WritersInSeveralProcessesLoseNothing) {
+  const TemporaryRoot device;
+  constexpr int kWriters = 4;
+  constexpr int kRounds = 50;
+  int gate[2];
+  ASSERT_EQ(pipe(gate), 0);
+  for (int writer = 0; writer < kWriters; ++writer) {
+    if (fork() == 0) {
+      close(gate[1]);
+      char end;
+      bool done = read(gate[0], &end, 1) == 0;  // all begin when the last has been started
+      Process process(device.root);
+      for (int round = 0; round < kRounds; ++round) {
+        process.set(std::to_string(writer * 100 + round), round);
+        done = process.synchronize() && done;
+      }
+      _exit(done ? 0 : 1);
+    }
+  }
+  close(gate[0]);
+  close(gate[1]);
+  for (int writer = 0; writer < kWriters; ++writer) {
+    int status = -1;
+    wait(&status);
+    EXPECT_EQ(status, 0);
+  }
+  EXPECT_EQ(Process(device.root).preferences->values(kDomain).size(),
+            std::size_t{kWriters * kRounds});
+}
+
+TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
+  for (const std::string content : {"", "garbage", "<plist version=\"1.0\"><array/></plist>"}) {
+    const TemporaryRoot device;
+    device.write(kFile, content);
+    Process process(device.root);
+    EXPECT_EQ(process.get("a"), "(null)");
+    EXPECT_EQ(process.get("b"), "(null)");
+    ASSERT_EQ(process.log.lines.size(), 1U) << "told once";
+    EXPECT_EQ(process.log.lines[0].find("cannot read preferences " + device.root.path(kFile)), 0U);
+    EXPECT_TRUE(process.synchronize());
+    EXPECT_EQ(*FileLayer().read(device.root.path(kFile), 100), content) << "left alone until then";
+
+    process.set("a", 1);
+    EXPECT_TRUE(process.synchronize());
+    EXPECT_EQ(process.all(), R"({"a":1})");
+    std::string aside;
+    for (const auto& entry : fs::directory_iterator(device.root.path(kFile.substr(0, 31)))) {
+      const std::string name = entry.path().filename();
+      if (name.starts_with("com.example.domain.plist.corrupt-")) aside = entry.path();
+    }
+    EXPECT_EQ(*FileLayer().read(aside, 100), content);
+    EXPECT_EQ(process.preferences->domains()->size(), 1U);
+  }
+}
+
+TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
+  const TemporaryRoot device;
+  fs::create_directories(device.root.path(kFile));  // a folder in the file's place
+  Process process(device.root);
+  process.set("a", 1);
+  EXPECT_FALSE(process.synchronize());
+  EXPECT_FALSE(process.synchronize());
+  EXPECT_EQ(process.log.lines, std::vector<std::string>{"cannot use " + device.root.path(kFile) +
+                                                        ": it is a folder; move it away"});
+  EXPECT_EQ(process.get("a"), "1");
+  fs::remove(device.root.path(kFile));
+  EXPECT_TRUE(process.synchronize());
+
+  // One value without a form does not hold up the others.
+  process.set("bad", plist::Date::sinceEpoch(std::nan("")));
+  process.set("good", 2);
+  EXPECT_TRUE(process.synchronize());
+  EXPECT_EQ(process.log.lines.size(), 2U);
+  EXPECT_EQ(process.all(), R"({"a":1,"good":2})");
+
+  process.set("huge", std::string(limits::kPreferenceFileBytes, 'x'));
+  EXPECT_FALSE(process.synchronize());
+  process.set("huge", {});
+  EXPECT_TRUE(process.synchronize());
+  EXPECT_EQ(Process(device.root).all(), R"({"a":1,"good":2})");
+}
+
+TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
+  const TemporaryRoot device;
+  Process process(device.root);
+  const std::string names[] = {"",          ".hidden",
+                               "..",        "../../etc/passwd",
+                               "a/b",       std::string("a\0b", 3),
+                               "line\nend", std::string(201, 'd')};
+  for (const std::string& name : names) {
+    EXPECT_FALSE(FilePreferences::isValidDomain(name)) << name;
+    process.preferences->ZTXPreferencesSetValue("k", 1, name);
+    EXPECT_TRUE(process.preferences->ZTXPreferencesGetValue("k", name).isNull());
+    EXPECT_FALSE(process.preferences->ZTXPreferencesSynchronize(name));
+  }
+  ASSERT_EQ(process.log.lines.size(), std::size(names));
+  EXPECT_EQ(process.log.lines[1],
+            "cannot set preference \"k\": \".hidden\" is no name of a domain; use 1 to 200 "
+            "characters without slash, control character or a dot in front");
+  EXPECT_TRUE(fs::is_empty(device.root.path("/")));
+  const std::string longest(limits::kPreferenceDomainBytes, 'd');
+  process.preferences->ZTXPreferencesSetValue("k", 1, longest);
+  EXPECT_TRUE(process.preferences->ZTXPreferencesSynchronize(longest));
+}
+
+TEST(Preferences, AreOldOrNewAfterEveryFault) {
+  // What the file may hold after each step that was reported as done.
+  const std::string kStates[] = {R"({"a":"old","kept":1})", R"({"a":"new","kept":1})",
+                                 R"({"b":2,"kept":1})"};
+  const auto makeSteps = [](Process& process) {
+    int done = 0;
+    process.set("a", "new");
+    if (process.synchronize()) done = 1;
+    process.set("a", {});
+    process.set("b", 2);
+    if (process.synchronize()) done = 2;
+    return done;
+  };
+  for (const bool corrupt : {false, true}) {
+    for (const auto fault : FaultyFileLayer::kFaults) {
+      int call = 1;
+      for (bool struck = true; struck; ++call) {
+        SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call
+                                        << (corrupt ? ", corrupt before" : ""));
+        const TemporaryRoot device;
+        if (corrupt) {
+          device.write(kFile, "garbage");
+        } else {
+          Process before(device.root);
+          before.set("a", "old");
+          before.set("kept", 1);
+        }
+        FaultyFileLayer faulty(device.root.path("/"), fault, call);
+        {
+          Process process(device.root, faulty);
+          int done = makeSteps(process);
+          struck = faulty.hasStruck();
+          if (faulty.goesOn()) {
+            EXPECT_TRUE(process.synchronize()) << "recovers by itself";
+            done = 2;
+          }
+          faulty.settle();
+          Process after(device.root);
+          const std::string found = after.all();
+          if (!corrupt) {
+            EXPECT_NE(std::find(kStates + done, std::end(kStates), found), std::end(kStates))
+                << found << " although step " << done << " was done";
+          } else if (done == 2) {
+            EXPECT_EQ(found, R"({"b":2})");
+          }
+          EXPECT_TRUE(corrupt || after.log.lines.empty());
+        }
+        Process again(device.root);
+        EXPECT_EQ(makeSteps(again), 2);
+        EXPECT_EQ(Process(device.root).all(), corrupt ? R"({"b":2})" : kStates[2]);
+        ASSERT_LT(call, 200);
+      }
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

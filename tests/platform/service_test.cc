@@ -1,0 +1,437 @@
+#include <chrono>
+#include <cstdlib>
+#include <fcntl.h>
+#include <filesystem>
+#include <functional>
+#include <gtest/gtest.h>
+#include <memory>
+#include <string>
+#include <sys/mman.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <vector>
+
+#include "base/limits.h"
+#include "platform/linux/file_notifications.h"
+#include "platform/linux/service_client.h"
+#include "platform/linux/service_message.h"
+#include "platform/linux/service_socket.h"
+#include "platform/linux/socket_service.h"
+#include "platform/plist/binary.h"
+#include "platform/plist/xml.h"
+
+namespace tavrel {
+namespace {
+
+using namespace std::chrono_literals;
+using Slice = EventLoop::Slice;
+
+constexpr std::string_view kName = "com.norvane.tallied.tavrel";
+constexpr int kAllSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
+
+struct RecordingLog final : SystemLog {
+  void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
+  bool says(std::string_view part) const {
+    for (const auto& line : lines) {
+      if (line.find(part) != std::string::npos) return true;
+    }
+    return false;
+  }
+  std::vector<std::string> lines;
+};
+
+/// A service below a root of its own that notes what its peers send.
+class ServiceTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    std::string pattern = testing::TempDir() + "tavrel-service-XXXXXX";
+    ASSERT_NE(mkdtemp(pattern.data()), nullptr);
+    useRoot(pattern);
+  }
+  void TearDown() override {
+    listener.reset();
+    std::filesystem::remove_all(folder);
+  }
+
+  void useRoot(const std::string& path) {
+    folder = path;
+    root = std::make_unique<DeviceRoot>(path);
+    services = std::make_unique<SocketServices>(loop, *root, log);
+  }
+  void listen() {
+    listener = services->createListener(kName);
+    ASSERT_TRUE(listener) << testing::PrintToString(log.lines);
+    listener->setPeerHandler([this](PeerConnection& peer) {
+      ++peers;
+      peer.setEventHandler([this](const plist::Value& event) {
+        if (event.isNull())
+          ++closures;
+        else
+          messages.push_back(event.dictionary());
+      });
+      peer.resume();
+    });
+    listener->resume();
+  }
+  ServiceClient connect() {
+    auto client = ServiceClient::connect(*root, kName);
+    if (!client) throw std::runtime_error(client.error().message);
+    return *std::move(client);
+  }
+  /// Runs the loop until nothing is ready any more; the number of events. What is no event ends an
+  /// empty slice too, so that several are needed to be sure.
+  int drain() {
+    int events = 0;
+    for (int idle = 0; idle < 16; ++idle) {
+      if (loop.runSlice(0ms) != Slice::HandledEvent) continue;
+      ++events;
+      idle = 0;
+    }
+    return events;
+  }
+  /// Sends one packet as it is, with `files` passed along.
+  static void sendRaw(const ServiceClient& client, ByteSpan bytes, std::vector<int> files = {}) {
+    iovec part{const_cast<std::byte*>(bytes.data()), bytes.size()};
+    alignas(cmsghdr) char control[CMSG_SPACE(8 * sizeof(int))] = {};
+    msghdr header{};
+    header.msg_iov = &part;
+    header.msg_iovlen = 1;
+    if (!files.empty()) {
+      header.msg_control = control;
+      header.msg_controllen = CMSG_SPACE(files.size() * sizeof(int));
+      cmsghdr* rights = CMSG_FIRSTHDR(&header);
+      *rights = {.cmsg_len = CMSG_LEN(files.size() * sizeof(int)),
+                 .cmsg_level = SOL_SOCKET,
+                 .cmsg_type = SCM_RIGHTS};
+      std::memcpy(CMSG_DATA(rights), files.data(), files.size() * sizeof(int));
+    }
+    EXPECT_EQ(sendmsg(client.get(), &header, MSG_NOSIGNAL), static_cast<ssize_t>(bytes.size()));
+  }
+  static Descriptor memoryFile(ByteSpan content, int seals) {
+    Descriptor file(memfd_create("test", MFD_CLOEXEC | MFD_ALLOW_SEALING));
+    EXPECT_EQ(write(file.get(), content.data(), content.size()),
+              static_cast<ssize_t>(content.size()));
+    EXPECT_EQ(fcntl(file.get(), F_ADD_SEALS, seals), 0);
+    return file;
+  }
+  static std::size_t openDescriptors() {
+    std::size_t count = 0;
+    for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd"))
+      count += entry.exists() || entry.is_symlink();
+    return count;
+  }
+  /// The exit status of `body` in a process of its own.
+  static int inChild(const std::function<int()>& body) {
+    const pid_t child = fork();
+    if (child == 0) _exit(body());
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+  }
+
+  std::string folder;
+  RecordingLog log;
+  LinuxEventLoop loop;
+  std::unique_ptr<DeviceRoot> root;
+  std::unique_ptr<SocketServices> services;
+  std::unique_ptr<ServiceListener> listener;
+  std::vector<plist::Dictionary> messages;
+  int peers = 0;
+  int closures = 0;
+};
+
+TEST_F(ServiceTest, DeliversMessagesOfBothSizesAndEncodingsInOrder) {
+  // The second root makes paths that a socket address cannot hold.
+  for (const std::string& path : {folder, folder + "/" + std::string(150, 'r')}) {
+    useRoot(path);
+    listen();
+    messages.clear();
+    peers = closures = 0;
+    const plist::Dictionary large{{"operation", 2}, {"data", std::string(1 << 20, 'x')}};
+    {
+      ServiceClient client = connect();
+      ASSERT_TRUE(client.send({{"operation", 0}}));
+      ASSERT_TRUE(client.send(large));
+      sendRaw(client, asBytes(*plist::writeXml(plist::Dictionary{{"operation", 7}})));
+    }
+    // The peer, three messages and the closure.
+    EXPECT_EQ(drain(), 5);
+    ASSERT_EQ(messages.size(), 3U) << testing::PrintToString(log.lines);
+    EXPECT_EQ(messages[0].number("operation")->int64(), 0);
+    EXPECT_EQ(plist::Value(messages[1]), plist::Value(large));
+    EXPECT_EQ(messages[2].number("operation")->int64(), 7);
+    EXPECT_EQ(closures, 1);
+    listener.reset();
+    EXPECT_FALSE(std::filesystem::exists(serviceSocketPath(*root, kName)));
+  }
+  EXPECT_EQ(log.lines, std::vector<std::string>());
+  folder.resize(folder.rfind('/'));
+}
+
+TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
+  listen();
+  const std::string good = *plist::writeBinary(plist::Dictionary{{"operation", 0}});
+  const auto goodBytes = asBytes(good);
+  const Descriptor sealed = memoryFile(goodBytes, kAllSeals);
+  const Descriptor unsealed = memoryFile(goodBytes, F_SEAL_SHRINK | F_SEAL_GROW);
+  const Descriptor noMessage = memoryFile(asBytes("<plist"), kAllSeals);
+  Descriptor huge(memfd_create("huge", MFD_CLOEXEC | MFD_ALLOW_SEALING));
+  ASSERT_EQ(ftruncate(huge.get(), (16 << 20) + 1), 0);
+  ASSERT_EQ(fcntl(huge.get(), F_ADD_SEALS, kAllSeals), 0);
+  const Descriptor ordinary(open("/proc/self/exe", O_RDONLY | O_CLOEXEC));
+  std::string nested = "<plist version=\"1.0\">";
+  for (int i = 0; i < 5000; ++i)
+    nested += "<array>";
+
+  struct Case {
+    std::string packet;
+    std::vector<int> files;
+    const char* reason;
+  };
+  const std::vector<Case> cases = {
+      {"garbage", {}, ""},
+      {good.substr(0, good.size() - 1), {}, ""},
+      {nested, {}, ""},
+      {"", {}, "the packet is empty"},
+      {*plist::writeXml(plist::Array{1}), {}, "the message is no dictionary"},
+      {std::string(70'000, 'x'), {}, "the packet is larger than 65536 bytes"},
+      {good, {sealed.get()}, "a packet that passes a memory file must be empty"},
+      {"", {sealed.get(), sealed.get(), sealed.get()}, "not exactly one descriptor"},
+      {"", {sealed.get(), sealed.get()}, "not exactly one descriptor"},
+      {"", {unsealed.get()}, "not sealed against shrinking, growing and writing"},
+      {"", {ordinary.get()}, "no memory file that can be sealed"},
+      {"", {huge.get()}, "the memory file has 16777217 bytes, the limit is 16777216"},
+      {"", {noMessage.get()}, ""},
+  };
+  std::size_t before = 0;
+  for (const Case& bad : cases) {
+    SCOPED_TRACE(testing::PrintToString(bad.packet.substr(0, 20)) + " " + bad.reason);
+    log.lines.clear();
+    closures = 0;
+    const ServiceClient client = connect();
+    sendRaw(client, asBytes(bad.packet), bad.files);
+    sendRaw(client, goodBytes);
+    EXPECT_EQ(drain(), 1) << "only the new peer is an event";
+    ASSERT_EQ(log.lines.size(), 1U);
+    EXPECT_TRUE(log.says(std::string(kName) + ": dropped peer " + std::to_string(getpid()) +
+                         " (user " + std::to_string(getuid()) + "): "));
+    EXPECT_TRUE(log.says(bad.reason)) << log.lines.front();
+    EXPECT_EQ(closures, 1);
+    EXPECT_TRUE(messages.empty()) << "what a dropped peer sent later is not read";
+    if (before == 0) before = openDescriptors();
+    EXPECT_EQ(openDescriptors(), before) << "a passed descriptor stayed open";
+  }
+
+  // From 20 lines a minute on they are counted instead.
+  for (int i = 0; i < 20; ++i) {
+    sendRaw(connect(), asBytes("garbage"));
+    drain();
+  }
+  log.lines.clear();
+  listener.reset();
+  EXPECT_EQ(log.lines, std::vector<std::string>{"13 more refusals were not logged"});
+}
+
+TEST_F(ServiceTest, TakesABurstOfThousandsWithoutLoss) {
+  listen();
+  constexpr std::int64_t kClients = 1000, kEach = 10;
+  std::vector<ServiceClient> clients;
+  for (std::int64_t i = 0; i < kClients; ++i)
+    clients.push_back(connect());
+  for (std::int64_t round = 0; round < kEach; ++round) {
+    for (std::int64_t i = 0; i < kClients; ++i) {
+      ASSERT_TRUE(clients[static_cast<std::size_t>(i)].send({{"client", i}, {"round", round}}));
+    }
+  }
+  clients.clear();
+  while (closures < kClients)
+    ASSERT_EQ(loop.runSlice(10s), Slice::HandledEvent);
+  EXPECT_EQ(peers, kClients);
+  ASSERT_EQ(messages.size(), static_cast<std::size_t>(kClients * kEach));
+  std::vector<std::int64_t> next(kClients, 0);
+  for (const auto& message : messages) {
+    const auto client = static_cast<std::size_t>(message.number("client")->int64());
+    ASSERT_EQ(message.number("round")->int64(), next[client]++);
+  }
+  EXPECT_EQ(log.lines, std::vector<std::string>());
+}
+
+TEST_F(ServiceTest, PeersBeyondTheLimitWaitForAPlace) {
+  listen();
+  std::vector<ServiceClient> clients;
+  for (std::size_t i = 0; i < limits::kServicePeers + 3; ++i) {
+    clients.push_back(connect());
+    drain();
+  }
+  ASSERT_TRUE(clients.back().send({{"operation", 1}}));
+  drain();
+  EXPECT_EQ(peers, static_cast<int>(limits::kServicePeers));
+  EXPECT_TRUE(log.says("new peers wait until one leaves: there are 2048"));
+  EXPECT_TRUE(messages.empty());
+  clients.erase(clients.begin(), clients.begin() + 3);
+  drain();
+  EXPECT_EQ(peers, static_cast<int>(limits::kServicePeers) + 3);
+  EXPECT_EQ(messages.size(), 1U);
+}
+
+TEST_F(ServiceTest, SilentPeersStopCountingAsEvents) {
+  listen();
+  const auto silentEvents = [this] {
+    int events = 0;
+    for (int i = 0; i < 2 * limits::kSilentConnections; ++i) {
+      connect();
+      events += drain();
+    }
+    return events;
+  };
+  EXPECT_EQ(silentEvents(), limits::kSilentConnections);
+  EXPECT_EQ(silentEvents(), 0);
+  EXPECT_EQ(peers, 4 * limits::kSilentConnections) << "they are served all the same";
+  ASSERT_TRUE(connect().send({{"operation", 0}}));
+  EXPECT_EQ(drain(), 2) << "a message, and the closure of the peer that sent it";
+  EXPECT_EQ(silentEvents(), limits::kSilentConnections);
+}
+
+TEST_F(ServiceTest, RefusesOtherUsers) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
+  listen();
+  // Against the mode of the file, so that the check of the credentials itself is met.
+  const std::string socket = serviceSocketPath(*root, kName);
+  struct stat status;
+  ASSERT_EQ(stat(socket.c_str(), &status), 0);
+  EXPECT_EQ(status.st_mode & 0777U, 0600U);
+  const auto tryAsNobody = [this] {
+    return inChild([this] {
+      if (setgid(65534) != 0 || setuid(65534) != 0) return 100;
+      auto client = ServiceClient::connect(*root, kName);
+      return client && client->send({{"operation", 1}}) ? 0 : 1;
+    });
+  };
+  ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
+  EXPECT_EQ(tryAsNobody(), 1);
+  ASSERT_EQ(chmod(socket.c_str(), 0666), 0);
+  EXPECT_EQ(tryAsNobody(), 0);
+  EXPECT_EQ(drain(), 0);
+  EXPECT_EQ(peers, 0);
+  EXPECT_TRUE(log.says("(user 65534): only root and user 0 may use the service"));
+}
+
+TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
+  const std::string socket = serviceSocketPath(*root, kName);
+  EXPECT_EQ(ServiceClient::connect(*root, kName).error().message,
+            "cannot connect to " + socket + ": No such file or directory; is the service started?");
+  EXPECT_EQ(inChild([this] { return services->createListener(kName).release() ? 0 : 1; }), 0);
+  ASSERT_TRUE(std::filesystem::exists(socket)) << "as after a kill";
+  EXPECT_EQ(ServiceClient::connect(*root, kName).error().message,
+            "cannot connect to " + socket + ": Connection refused; is the service started?");
+  listen();
+  EXPECT_EQ(services->createListener(kName), nullptr);
+  EXPECT_TRUE(log.says("cannot listen at " + socket + ": another process listens there"));
+  ASSERT_TRUE(connect().send({{"operation", 0}}));
+  drain();
+  EXPECT_EQ(messages.size(), 1U);
+
+  // A listener that does not hold the lock, as the service manager's.
+  std::filesystem::remove(folder + "/run/tavrel/" + std::string(kName) + ".lock");
+  log.lines.clear();
+  EXPECT_EQ(services->createListener(kName), nullptr);
+  EXPECT_TRUE(log.says("another process listens there"));
+  listener.reset();
+
+  std::filesystem::create_directory(socket);
+  log.lines.clear();
+  EXPECT_EQ(services->createListener(kName), nullptr);
+  EXPECT_TRUE(log.says("the file there is no socket; remove it"));
+  EXPECT_EQ(services->createListener("../x"), nullptr);
+}
+
+/// Runs in a process of its own whose descriptors 3 and 4 are `third` and `fourth`.
+int takeOver(int third, int fourth, const char* process, const char* names,
+             const std::function<bool()>& check) {
+  const Descriptor a(fcntl(third, F_DUPFD, 100)), b(fcntl(fourth, F_DUPFD, 100));
+  if (dup2(a.get(), 3) != 3 || dup2(b.get(), 4) != 4) return 100;
+  setenv("LISTEN_PID", process ? process : std::to_string(getpid()).c_str(), 1);
+  setenv("LISTEN_FDS", "2", 1);
+  if (names) setenv("LISTEN_FDNAMES", names, 1);
+  return check() ? 0 : 1;
+}
+
+TEST_F(ServiceTest, TakesOverTheServiceManagersSocket) {
+  auto managers = ServiceSocket::open(*root, kName);
+  ASSERT_TRUE(managers);
+  ASSERT_EQ(fcntl(managers->get(), F_SETFL, 0), 0);  // blocking, as it may be handed over
+  const Descriptor stream(socket(AF_UNIX, SOCK_STREAM, 0));
+  ASSERT_TRUE(connect().send({{"operation", 5}}));
+
+  const auto serves = [this] {
+    LinuxEventLoop childLoop;
+    SocketServices childServices(childLoop, *root, log);
+    auto taken = childServices.createListener(kName);
+    if (!taken || !log.lines.empty()) return false;
+    std::int64_t operation = 0;
+    taken->setPeerHandler([&](PeerConnection& peer) {
+      peer.setEventHandler([&](const plist::Value& event) {
+        if (const auto number = event.dictionary().number("operation")) operation = number->int64();
+      });
+      peer.resume();
+    });
+    taken->resume();
+    while (childLoop.runSlice(0ms) == Slice::HandledEvent) {
+    }
+    const bool inheritable = (fcntl(3, F_GETFD) & FD_CLOEXEC) == 0;
+    taken.reset();
+    return operation == 5 && !inheritable &&
+           std::filesystem::exists(serviceSocketPath(*root, kName));
+  };
+  const int good = managers->get();
+  EXPECT_EQ(inChild([&] { return takeOver(stream.get(), good, nullptr, nullptr, serves); }), 0);
+  ASSERT_TRUE(connect().send({{"operation", 5}}));
+  const std::string names = "other:" + std::string(kName);
+  EXPECT_EQ(inChild([&] { return takeOver(good, good, nullptr, names.c_str(), serves); }), 0);
+
+  const auto refusal = [&](const char* process, const char* fdNames, const char* why) {
+    return inChild([&] {
+      return takeOver(good, good, process, fdNames,
+                      [&] { return services->createListener(kName) == nullptr && log.says(why); });
+    });
+  };
+  EXPECT_EQ(refusal(nullptr, "a:b", "can be told to be"), 0);
+  EXPECT_EQ(refusal("1", kName.data(), "another process listens there"), 0)
+      << "meant for another process";
+}
+
+TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
+  constexpr std::string_view kNotification = "com.norvane.tallied.tavrel.logging";
+  FileNotifications notifications(*root, log);
+  EXPECT_EQ(*notifications.count(kNotification), 0U);
+  EXPECT_EQ(*notifications.waitBeyond(kNotification, 0, 0ms), 0U);
+  notifications.post(kNotification);
+  EXPECT_EQ(*notifications.waitBeyond(kNotification, 0, 1h), 1U);
+
+  // Two processes post while this one waits for the last of it.
+  std::vector<pid_t> posters;
+  for (int process = 0; process < 2; ++process) {
+    const pid_t child = fork();
+    if (child == 0) {
+      for (int i = 0; i < 200; ++i)
+        notifications.post(kNotification);
+      _exit(0);
+    }
+    posters.push_back(child);
+  }
+  std::uint64_t seen = 1;
+  while (seen < 401)
+    seen = *notifications.waitBeyond(kNotification, seen, 1h);
+  EXPECT_EQ(seen, 401U);
+  for (const pid_t child : posters)
+    waitpid(child, nullptr, 0);
+
+  notifications.post("../escape");
+  EXPECT_EQ(log.lines, std::vector<std::string>{"cannot post ../escape: ../escape is not the name "
+                                                "of a notification"});
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,295 @@
+#include <cmath>
+#include <cstdlib>
+#include <fcntl.h>
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <limits>
+#include <regex>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/statvfs.h>
+#include <sys/un.h>
+#include <sys/utsname.h>
+#include <unistd.h>
+
+#include "base/text.h"
+#include "fixed_clock.h"
+#include "platform/linux/digests.h"
+#include "platform/linux/file_crash_reporting.h"
+#include "platform/linux/file_device_answers.h"
+#include "platform/linux/json_line.h"
+#include "platform/linux/linux_clock.h"
+#include "platform/linux/linux_files.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/linux_system_log.h"
+#include "platform/linux/linux_system_version.h"
+#include "platform/linux/stamp.h"
+#include "platform/plist/coding.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+struct Services : TemporaryRoot {
+  KeptLog log;
+  FileLayer files;
+  FixedClock clock;
+  plist::PlistCoding propertyLists;
+  LinuxSystemVersion version{root, files, propertyLists, log};
+  FileDeviceAnswers answers{root, files, propertyLists, log};
+
+  std::string read(std::string_view path) const {
+    return *FileLayer().read(root.path(path), 1U << 20);
+  }
+};
+
+TEST(DeviceRoot, JoinsPaths) {
+  EXPECT_EQ(DeviceRoot("/").path("/etc/x"), "/etc/x");
+  EXPECT_EQ(DeviceRoot("/srv/one//").path("/etc/x"), "/srv/one/etc/x");
+  EXPECT_EQ(DeviceRoot("here").path("etc/x"), "here/etc/x");
+  EXPECT_EQ(DeviceRoot("/srv/none").pathOrMachine("/etc/passwd"), "/etc/passwd");
+}
+
+TEST(DeviceAnswers, ComeFromTheFileAndTheFileSystem) {
+  Services device;
+  struct statvfs status {};
+  ASSERT_EQ(statvfs(device.root.path("/").c_str(), &status), 0);
+  const auto capacity = static_cast<std::int64_t>(status.f_blocks * status.f_frsize);
+  const auto usage = device.answers.SQCopyAnswer("DiskUsage").dictionary();
+  EXPECT_EQ(usage.number("TotalDiskCapacity"), capacity);
+  EXPECT_GT(usage.number("TotalDataAvailable")->int64(), 0);
+  EXPECT_TRUE(device.answers.SQCopyAnswer("InternalBuild").isNull());
+
+  device.write("/etc/tavrel/device-answers.plist",
+               "<plist version=\"1.0\"><dict><key>InternalBuild</key><true/>"
+               "<key>DiskUsage</key><dict/></dict></plist>");
+  FileDeviceAnswers recorded(device.root, device.files, device.propertyLists, device.log);
+  EXPECT_TRUE(recorded.SQGetBoolAnswer("InternalBuild"));
+  EXPECT_EQ(textOf(recorded.SQCopyAnswer("DiskUsage")), "{}");
+  recorded.SQCopyAnswer("DiskUsage").dictionary().set("x", 1);
+  EXPECT_EQ(textOf(recorded.SQCopyAnswer("DiskUsage")), "{}") << "each answer is the caller's own";
+  EXPECT_TRUE(device.log.lines.empty());
+}
+
+TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
+  utsname kernel{};
+  ASSERT_EQ(uname(&kernel), 0);
+  const std::string release = kernel.release;
+  const struct {
+    std::string osRelease, text;
+  } kCases[] = {
+      {"NAME=\"Debian GNU/Linux\"\nVERSION_ID=\"12\"\n",
+       "Debian GNU/Linux 12 (12-" + release + ")"},
+      {"# NAME=no\n NAME='A \"b\" \\c'\r\nVERSION_ID=1\nNAMES=no\nBUILD_ID=20.1",
+       "A \"b\" \\c 1 (20.1)"},
+      {"NAME=one\nNAME=\"t\\\"w\\$o\"\nBUILD_ID=rolling\n", "t\"w$o (rolling)"},
+      {"", "(" + release + ")"},
+  };
+  for (const auto& [osRelease, text] : kCases) {
+    Services device;
+    device.write("/usr/lib/os-release", osRelease);
+    EXPECT_EQ(device.version.text(), text);
+  }
+  Services device;
+  device.write("/etc/tavrel/system-version.plist",
+               "<plist version=\"1.0\"><dict><key>ProductName</key><string>Pellio</string>"
+               "<key>ProductBuildVersion</key><string>16R349</string></dict></plist>");
+  device.version.systemVersionDictionary().set("ProductName", "changed");
+  EXPECT_EQ(device.version.text(), "Pellio (16R349)");
+}
+
+TEST(Facts, AFileThatCannotServeIsToldOnceAndLeftOut) {
+  Services device;
+  device.write("/etc/tavrel/device-answers.plist", "<plist version=\"1.0\"><array/></plist>");
+  EXPECT_TRUE(device.answers.SQCopyAnswer("a").isNull());
+  EXPECT_TRUE(device.answers.SQCopyAnswer("b").isNull());
+  EXPECT_EQ(device.log.lines,
+            std::vector<std::string>{"cannot read " +
+                                     device.root.path("/etc/tavrel/device-answers.plist") +
+                                     ": it holds no dictionary; mend or remove it"});
+}
+
+TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {
+  Services device;
+  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  const std::string folder = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
+  const std::byte bytes[] = {std::byte{0xAB}, std::byte{0x01}};
+  reporting.FLLogStructuredData(
+      172, {{"id", std::numeric_limits<std::int64_t>::min()},
+            {"big", std::numeric_limits<std::uint64_t>::max()},
+            {"real", 0.1},
+            {"nan", std::nan("")},
+            {"list", plist::Array{true, plist::Data(bytes), plist::Array::create()}},
+            {"te\"xt", "a\nb"},
+            {"date", device.clock.time}});
+  reporting.FLLogStructuredData(172, {});
+  EXPECT_EQ(device.read(folder + "172-2026-11-27.jsonl"),
+            R"({"time":"2026-11-27T18:02:18.250Z","type":172,"record":{"id":-9223372036854775808,)"
+            R"("big":18446744073709551615,"real":0.1,"nan":"nan","list":[true,"ab01",[]],)"
+            R"("te\"xt":"a\nb","date":"2026-11-27T18:02:18.250Z"}})"
+            "\n"
+            R"({"time":"2026-11-27T18:02:18.250Z","type":172,"record":null})"
+            "\n");
+
+  for (const char* name : {"172-2026-10-27.jsonl", "176-1999-01-01.jsonl", "172-2026-10-28.jsonl",
+                           "172-2030-01-01.jsonl", "notes.txt", "x172-1999-01-01.jsonl"}) {
+    device.write(folder + name, "x\n");
+  }
+  reporting.FLDumpAllOldStructuredDataLogs();
+  EXPECT_EQ(
+      *device.files.list(device.root.path(folder)),
+      (std::vector<std::string>{"172-2026-10-28.jsonl", "172-2026-11-27.jsonl",
+                                "172-2030-01-01.jsonl", "notes.txt", "x172-1999-01-01.jsonl"}));
+  EXPECT_TRUE(device.log.lines.empty());
+}
+
+TEST(CrashReporting, RollsTheSupportLog) {
+  Services device;
+  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  const std::string log = "/var/mobile/Library/Logs/NorvaneCare/support.log";
+  const auto held = [&] {
+    std::string all;
+    for (const char* number : {"", ".1", ".2", ".3", ".4", ".5", ".6"}) {
+      const auto text = *device.files.readIfPresent(device.root.path(log + number), 10);
+      all += text.value_or("-");
+    }
+    return all;
+  };
+  reporting.rollNorvaneCareLogs();
+  for (const char* text : {"a", "b", "c", "", "d", "e", "f"}) {
+    device.write(log, text);
+    reporting.rollNorvaneCareLogs();
+  }
+  EXPECT_EQ(held(), "-fedcb-");
+  fs::remove(device.root.path(log + ".2"));  // as a roll that was cut short leaves it
+  device.write(log, "g");
+  reporting.rollNorvaneCareLogs();
+  EXPECT_EQ(held(), "-gfdcb-");
+  EXPECT_TRUE(device.log.lines.empty());
+}
+
+TEST(CrashReporting, NamesTheDevice) {
+  Services device;
+  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  const std::string machine = "0123456789abcdef0123456789abcdef";
+  device.write("/etc/machine-id", machine + "\n");
+  device.write("/sys/firmware/devicetree/base/model", std::string("Pellio \tBoard 2\0", 16));
+  const std::regex uuid("[0-9A-F]{8}-[0-9A-F]{4}-[0-9A-F]{4}-[0-9A-F]{4}-[0-9A-F]{12}");
+  const std::string identifier = reporting.systemIdentifier();
+  EXPECT_TRUE(std::regex_match(identifier, uuid)) << identifier;
+  EXPECT_EQ(identifier, reporting.systemIdentifier());
+  EXPECT_EQ(reporting.hardwareModel(), "Pellio  Board 2");
+  EXPECT_EQ(reporting.osVersion(), device.version.text());
+  const std::string incident = reporting.incidentIdentifier();
+  EXPECT_TRUE(std::regex_match(incident, uuid)) << incident;
+  EXPECT_EQ(incident[14], '4');
+  EXPECT_NE(incident, reporting.incidentIdentifier());
+  device.write("/etc/machine-id", "uninitialized\n");
+  EXPECT_EQ(reporting.systemIdentifier(), "unknown");
+}
+
+TEST(SystemLog, WritesLinesOnAStream) {
+  int ends[2];
+  ASSERT_EQ(pipe(ends), 0);
+  const Descriptor reading(ends[0]), writing(ends[1]);
+  unsetenv("JOURNAL_STREAM");
+  LinuxSystemLog log(writing.get());
+  log.write(LogLevel::Default, "tavrel started");
+  log.write(LogLevel::Error, "one\ntwo\n");
+  std::string text(1000, '\0');
+  text.resize(static_cast<std::size_t>(read(reading.get(), text.data(), text.size())));
+  const std::string time = R"(\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{3}Z)";
+  EXPECT_TRUE(std::regex_match(
+      text, std::regex(time + " default tavrel started\n" + time + " error one\n  two\n  \n")))
+      << text;
+}
+
+TEST(SystemLog, SpeaksToTheJournalWhenTheStreamIsItsOwn) {
+  const TemporaryRoot device;
+  const std::string path = device.root.path("/socket");
+  const Descriptor journal(socket(AF_UNIX, SOCK_DGRAM, 0));
+  sockaddr_un address{.sun_family = AF_UNIX, .sun_path = {}};
+  path.copy(address.sun_path, sizeof(address.sun_path) - 1);
+  ASSERT_EQ(bind(journal.get(), reinterpret_cast<sockaddr*>(&address), sizeof(address)), 0);
+  const Descriptor stream(open(device.root.path("/stream").c_str(), O_RDWR | O_CREAT, 0600));
+  struct stat status {};
+  ASSERT_EQ(fstat(stream.get(), &status), 0);
+  const std::string name = std::to_string(status.st_dev) + ":" + std::to_string(status.st_ino);
+  setenv("JOURNAL_STREAM", name.c_str(), 1);
+  LinuxSystemLog log(stream.get(), path);
+  LinuxSystemLog without(stream.get(), path + ".none");
+  unsetenv("JOURNAL_STREAM");
+
+  const auto received = [&](int flags = 0) {
+    std::string packet(1000, '\0');
+    const ssize_t size = recv(journal.get(), packet.data(), packet.size(), flags);
+    packet.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
+    return packet;
+  };
+  setenv("JOURNAL_STREAM", name.c_str(), 1);
+  log.write(LogLevel::Info, "one\ntwo");
+  without.write(LogLevel::Error, "one\ntwo");
+  unsetenv("JOURNAL_STREAM");
+  const std::string packet = received();
+  EXPECT_EQ(packet.substr(0, 29), "PRIORITY=6\nSYSLOG_IDENTIFIER=");
+  EXPECT_TRUE(packet.ends_with(std::string("\nMESSAGE\n\7\0\0\0\0\0\0\0one\ntwo\n", 25))) << packet;
+
+  // An entry beyond a datagram arrives as a file, without bytes of its own.
+  log.write(LogLevel::Info, std::string(16U << 20, 'x'));
+  EXPECT_EQ(received(MSG_DONTWAIT), "");
+  EXPECT_EQ(*FileLayer().read(device.root.path("/stream"), 100), "<3>one\n<3>two\n");
+}
+
+TEST(SmallServices, AnswerWhatTheyAreFor) {
+  Services device;
+  std::string digest;
+  LinuxDigest md5;
+  appendHex(digest, md5.md5(asBytes("abc")));
+  EXPECT_EQ(digest, "900150983cd24fb0d6963f7d28e17f72");
+  digest.clear();
+  appendHex(digest, sha256(asBytes("abc")));
+  EXPECT_EQ(digest, "ba7816bf8f01cfea414140de5dae2223b00361a396177a9cb410ff61f20015ad");
+
+  LinuxClock clock;
+  const std::uint64_t before = clock.ticks();
+  EXPECT_LE(before, clock.ticks());
+  EXPECT_EQ(clock.timeBase()->numerator, 1U);
+  EXPECT_NEAR(clock.now().secondsSince1970(), static_cast<double>(time(nullptr)), 2.0);
+  EXPECT_EQ(dayOf(plist::Date::since1970(-0.5)), -1);
+  EXPECT_EQ(compactStamp(plist::Date::since1970(-0.5)), "19691231T235959Z");
+  EXPECT_EQ(preciseStamp(plist::Date::since1970(-0.5)), "1969-12-31T23:59:59.500Z");
+
+  LinuxFiles files(device.root, device.files);
+  device.write("/a/file", "12345");
+  EXPECT_EQ(*files.read("/a/file", 5), "12345");
+  EXPECT_EQ(files.size("/a/file"), 5);
+  EXPECT_EQ(files.size("/a/none"), std::nullopt);
+}
+
+TEST(Platform, WritesNothingUnlessAskedAndEverythingAtTheEnd) {
+  const TemporaryRoot device;
+  {
+    LinuxPlatform untouched(device.root);
+    EXPECT_FALSE(untouched.platform().submission.isDiagnosticSubmissionEnabled());
+  }
+  EXPECT_TRUE(fs::is_empty(device.root.path("/")));
+  {
+    LinuxPlatform linux(device.root);
+    linux.platform().preferences.ZTXPreferencesSetValue("k", 7, "com.example");
+    linux.platform().statistics.BHClientSetValueForScalarKey("com.example.key", 9);
+  }
+  LinuxPlatform later(device.root);
+  Platform& platform = later.platform();
+  EXPECT_EQ(platform.preferences.ZTXPreferencesGetIntegerValue("k", "com.example"), 7);
+  const std::int32_t today = platform.statistics.BHDaysSince1970();
+  std::int64_t found = 0;
+  platform.statistics.initWithDefaultPath()->scalarsForKeyPrefix(
+      "", today - 1, today,
+      [&](std::string_view, std::int32_t, std::int64_t value, bool&) { found = value; });
+  EXPECT_EQ(found, 9);
+}
+
+}  // namespace
+}  // namespace tavrel

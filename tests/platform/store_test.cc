@@ -1,0 +1,624 @@
+#include <atomic>
+#include <bit>
+#include <csignal>
+#include <filesystem>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <iterator>
+#include <limits>
+#include <map>
+#include <memory>
+#include <sqlite3.h>
+#include <string>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+#include <vector>
+
+#include "platform/linux/sqlite_store.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::int32_t kFirstDay = std::numeric_limits<std::int32_t>::min();
+constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
+constexpr std::int64_t kSmallest = std::numeric_limits<std::int64_t>::min();
+constexpr std::int64_t kLargest = std::numeric_limits<std::int64_t>::max();
+constexpr std::int32_t kToday = 20781;
+
+struct SetClock : Clock {
+  plist::Date now() override { return instant; }
+  std::uint64_t ticks() override { return 0; }
+  std::optional<TimeBase> timeBase() override { return TimeBase{1, 1}; }
+  plist::Date instant = plist::Date::since1970(kToday * 86400.0 + 80000);
+};
+
+struct HeldPreferences : Preferences {
+  plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) override {
+    return values[std::string(domain) + "/" + std::string(key)];
+  }
+  void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
+                              std::string_view domain) override {
+    values[std::string(domain) + "/" + std::string(key)] = value;
+  }
+  bool ZTXPreferencesSynchronize(std::string_view domain) override {
+    synchronised.emplace_back(domain);
+    return true;
+  }
+  std::map<std::string, plist::Value> values;
+  std::vector<std::string> synchronised;
+};
+
+struct Row {
+  std::string key;
+  std::int32_t day;
+  std::int64_t value;
+  bool operator==(const Row&) const = default;
+};
+void PrintTo(const Row& row, std::ostream* out) {
+  *out << '"' << row.key.substr(0, 20) << "\"/" << row.day << '=' << row.value;
+}
+using Rows = std::vector<Row>;
+
+using Sample = BHHistoryDistributionEnumerator::Sample;
+
+std::string contentOf(const std::string& path) {
+  std::ifstream stream(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+class StoreTest : public testing::Test {
+ protected:
+  std::unique_ptr<SqliteStore> open(int busyMilliseconds = 10'000) {
+    return std::make_unique<SqliteStore>(root_.root, clock_, preferences_, log_, busyMilliseconds);
+  }
+
+  static Rows scalars(BHHistory& history, std::string_view prefix, std::int64_t min,
+                      std::int64_t max) {
+    Rows rows;
+    history.scalarsForKeyPrefix(
+        prefix, min, max, [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+          rows.push_back({std::string(key), day, value});
+        });
+    return rows;
+  }
+  Rows scalarsOfToday() { return scalars(*store_->initWithDefaultPath(), "", kToday - 1, kToday); }
+
+  static std::vector<Sample> take(BHHistoryDistributionEnumerator& values) {
+    std::vector<Sample> samples;
+    Sample sample;
+    while (values.getNextValue(sample.value, sample.secondsInDayOffset))
+      samples.push_back(sample);
+    return samples;
+  }
+
+  void set(const Rows& rows) {
+    auto batch = store_->beginBatch();
+    ASSERT_TRUE(batch) << batch.error().message;
+    for (const Row& row : rows)
+      ASSERT_TRUE((*batch)->setScalar(row.day, row.key, row.value));
+    ASSERT_TRUE((*batch)->commit());
+  }
+
+  /// Runs SQL on the file as another program would; yields the first column of all rows.
+  std::vector<std::string> sql(const std::string& text) {
+    sqlite3* handle = nullptr;
+    EXPECT_EQ(sqlite3_open(store_->path().c_str(), &handle), SQLITE_OK);
+    std::vector<std::string> column;
+    char* message = nullptr;
+    sqlite3_exec(
+        handle, text.c_str(),
+        [](void* out, int count, char** values, char**) {
+          const char* const last = values[count - 1];
+          static_cast<std::vector<std::string>*>(out)->emplace_back(last ? last : "NULL");
+          return 0;
+        },
+        &column, &message);
+    EXPECT_EQ(message, nullptr) << message;
+    sqlite3_free(message);
+    sqlite3_close(handle);
+    return column;
+  }
+
+  std::vector<std::string> setAsideFiles() {
+    std::vector<std::string> files;
+    for (const auto& entry :
+         std::filesystem::directory_iterator(std::filesystem::path(store_->path()).parent_path())) {
+      if (entry.path().string().find(".corrupt-") != std::string::npos) {
+        files.push_back(entry.path());
+      }
+    }
+    return files;
+  }
+
+  std::int64_t corruptions() {
+    return preferences_.ZTXPreferencesGetIntegerValue("DatabaseCorruptionCount",
+                                                      "com.norvane.tallied");
+  }
+
+  TemporaryRoot root_;
+  SetClock clock_;
+  HeldPreferences preferences_;
+  KeptLog log_;
+  std::unique_ptr<SqliteStore> store_ = open();
+};
+
+TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
+  const std::string nul("a\0b", 3);
+  const std::string longKey(100'000, 'k');
+  const Rows today = {{"", kToday, 0},          {"\x01\x1F\x7F", kToday, -1},
+                      {"a", kToday, kSmallest}, {nul, kToday, kLargest},
+                      {"a'\"%_;--", kToday, 1}, {"aa", kToday, 2},
+                      {longKey, kToday, 3},     {"\xC3\xA9", kToday, 4},
+                      {"\xFF", kToday, 5},      {"\xFF\xFF", kToday, 6}};
+  set(Rows(today.rbegin(), today.rend()));
+  set({{"a", kToday - 1, 7}, {"a", kFirstDay, 8}, {"a", kLastDay, 9}, {"b", kLastDay, 10}});
+
+  const auto history = store_->initWithDefaultPath();
+  EXPECT_EQ(scalars(*history, "", kToday - 1, kToday), today);
+
+  // Bounds exclude the lower and include the upper day; several days come by key, then by day.
+  const struct {
+    std::string prefix;
+    std::int64_t min, max;
+    Rows rows;
+  } cases[] = {
+      {"a", kToday - 1, kToday, {today[2], today[3], today[4], today[5]}},
+      {nul, kToday - 1, kToday, {today[3]}},
+      {"\xFF", kToday - 1, kToday, {today[8], today[9]}},
+      {"\xFF\xFF", kToday - 2, kToday, {today[9]}},
+      {"b", kToday - 1, kToday, {}},
+      {"", kToday, kToday, {}},
+      {"", kToday, kToday - 1, {}},
+      {"", kFirstDay, kToday - 1, {{"a", kToday - 1, 7}}},
+      {"", std::int64_t{kFirstDay} - 1, kFirstDay, {{"a", kFirstDay, 8}}},
+      {"", std::int64_t{kLastDay} - 1, kLastDay, {{"a", kLastDay, 9}, {"b", kLastDay, 10}}},
+      {"", kLargest, kLargest, {}},
+      {"", kSmallest, kSmallest, {}},
+      {"a", kSmallest, kToday - 1, {{"a", kFirstDay, 8}, {"a", kToday - 1, 7}}},
+      {"b", kSmallest, kLargest, {{"b", kLastDay, 10}}},
+      {"\xFF", kSmallest, kLargest, {today[8], today[9]}},
+  };
+  for (const auto& item : cases) {
+    EXPECT_EQ(scalars(*history, item.prefix, item.min, item.max), item.rows)
+        << item.prefix << ' ' << item.min << ' ' << item.max;
+  }
+
+  int calls = 0;
+  history->scalarsForKeyPrefix(
+      "", kSmallest, kLargest,
+      [&](std::string_view, std::int32_t, std::int64_t, bool& stop) { stop = ++calls == 3; });
+  EXPECT_EQ(calls, 3);
+
+  const auto held = (*store_->openHistory())->holdings();
+  ASSERT_TRUE(held);
+  EXPECT_EQ(held->days, 4);
+  EXPECT_EQ(held->firstDay, kFirstDay);
+  EXPECT_EQ(held->lastDay, kLastDay);
+
+  auto batch = store_->beginBatch();
+  const std::string tooLong(limits::kStoreKeyBytes + 1, 'k');
+  EXPECT_EQ((*batch)->setScalar(kToday, tooLong, 1).error().message,
+            "statistics store " + store_->path() +
+                ": a key of 1048577 bytes is refused: the longest allowed has 1048576");
+  EXPECT_TRUE((*batch)->addScalar(kToday, "aa", kLargest - 2));
+  EXPECT_EQ((*batch)->addScalar(kToday, "aa", 1).error().message,
+            "adding 1 to 9223372036854775807 goes beyond 64 bits: set the value instead");
+  EXPECT_TRUE((*batch)->addScalar(kToday, "new", -5));
+  ASSERT_TRUE((*batch)->commit());
+  EXPECT_EQ(scalars(*history, "new", kToday - 1, kToday), (Rows{{"new", kToday, -5}}));
+  EXPECT_TRUE(log_.lines.empty()) << log_.lines[0];
+}
+
+TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
+  const std::uint64_t patterns[] = {0,
+                                    0x8000000000000000,
+                                    1,
+                                    0x7FF0000000000000,
+                                    0xFFF0000000000000,
+                                    0x7FF8000000000000,
+                                    0x7FF8000000000123,
+                                    0xFFF8000000000000,
+                                    0x7FF0000000000001,
+                                    0x3FF0000000000001};
+  // Sizes of transactions around the size of a chunk; two keys mixed in each.
+  std::size_t total = 0;
+  for (const std::size_t size : {1U, 2U, 1020U, 1U, 1U, 1023U, 3000U, 0U, 1U}) {
+    auto batch = store_->beginBatch();
+    ASSERT_TRUE(batch);
+    for (std::size_t i = 0; i < size; ++i, ++total) {
+      const auto seconds = static_cast<std::uint32_t>(0xFFFFFFFF - total);
+      const double value = std::bit_cast<double>(patterns[total % std::size(patterns)]);
+      ASSERT_TRUE((*batch)->appendValue(kToday, "d.one", seconds, value));
+      ASSERT_TRUE((*batch)->appendValue(kToday, "d.two", 0, static_cast<double>(total)));
+    }
+    ASSERT_TRUE((*batch)->commit());
+  }
+  ASSERT_EQ(total, 5049U);
+  EXPECT_EQ(sql("SELECT count(*) FROM chunks"), (std::vector<std::string>{"10"}));
+  {
+    auto forgotten = store_->beginBatch();
+    ASSERT_TRUE((*forgotten)->appendValue(kToday, "d.one", 1, 1));
+    ASSERT_TRUE((*forgotten)->setScalar(kToday, "s", 1));
+  }
+  EXPECT_EQ(scalarsOfToday(), Rows{});
+
+  std::vector<std::string> keys;
+  store_->initWithDefaultPath()->distributionsForKeyPrefix(
+      "d.", kToday - 1, kToday,
+      [&](std::string_view key, std::int32_t, BHHistoryDistributionEnumerator& values, bool&) {
+        keys.emplace_back(key);
+        const auto samples = take(values);
+        ASSERT_EQ(samples.size(), total);
+        for (std::size_t i = 0; i < total; ++i) {
+          if (key == "d.one") {
+            ASSERT_EQ(std::bit_cast<std::uint64_t>(samples[i].value),
+                      patterns[i % std::size(patterns)]);
+            ASSERT_EQ(samples[i].secondsInDayOffset, 0xFFFFFFFF - i);
+          } else {
+            ASSERT_EQ(samples[i].value, static_cast<double>(i));
+          }
+        }
+      });
+  EXPECT_EQ(keys, (std::vector<std::string>{"d.one", "d.two"}));
+}
+
+TEST_F(StoreTest, ReadsOnlyTheValuesThatAreAskedFor) {
+  auto batch = store_->beginBatch();
+  ASSERT_TRUE((*batch)->appendValue(kToday, "bad", 1, 1));
+  ASSERT_TRUE((*batch)->appendValue(kToday, "good", 2, 2));
+  ASSERT_TRUE((*batch)->commit());
+  batch->reset();
+  sql("UPDATE chunks SET data = x'00' WHERE chunk = 0");
+
+  const auto history = store_->openHistory();
+  std::vector<std::string> seen;
+  const auto walk = [&](bool readsBad) {
+    seen.clear();
+    return (*history)->walkDistributions(
+        "", kFirstDay, kLastDay,
+        [&](std::string_view key, std::int32_t, std::int64_t count,
+            BHHistoryDistributionEnumerator& values, bool&) {
+          EXPECT_EQ(count, 1);
+          if (key == "good" || readsBad) {
+            seen.push_back(std::string(key) + ":" + std::to_string(take(values).size()));
+          }
+        });
+  };
+  EXPECT_TRUE(walk(false));
+  EXPECT_EQ(seen, (std::vector<std::string>{"good:1"}));
+  EXPECT_EQ(walk(true).error().message,
+            "statistics store " + store_->path() +
+                ": the values of a distribution are not in the form that this program writes: "
+                "restore the file from a copy or move it away");
+
+  // A writer does not build on it either.
+  batch = store_->beginBatch();
+  ASSERT_TRUE((*batch)->appendValue(kToday, "bad", 3, 3));
+  EXPECT_FALSE((*batch)->commit());
+  EXPECT_EQ(corruptions(), 0);
+}
+
+TEST_F(StoreTest, TheDaysQueryIsOneWalkAlongTheKey) {
+  set({{"a", kToday, 1}});
+  const auto plan = [&](std::string_view query) {
+    return sql("EXPLAIN QUERY PLAN " + std::string(query));
+  };
+  EXPECT_EQ(plan(store_sql::kScalarsOfDay),
+            (std::vector<std::string>{"SEARCH scalars USING PRIMARY KEY (day=? AND key>?)"}));
+  EXPECT_EQ(plan(store_sql::kDistributionsOfDay),
+            (std::vector<std::string>{"SEARCH distributions USING PRIMARY KEY (day=? AND key>?)"}));
+  EXPECT_EQ(plan(store_sql::kScalarsByDay),
+            (std::vector<std::string>{"SEARCH scalars USING PRIMARY KEY (day>? AND day<?)"}));
+  EXPECT_EQ(
+      plan(store_sql::kChunks),
+      (std::vector<std::string>{"SEARCH chunks USING INTEGER PRIMARY KEY (rowid>? AND rowid<?)"}));
+}
+
+TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
+  EXPECT_EQ(store_->BHDaysSince1970(), kToday);
+  EXPECT_EQ(store_->dateForDaysSince1970(kFirstDay).secondsSince1970(), -185542587187200.0);
+  store_->BHClientCheckpoint();
+  EXPECT_FALSE(std::filesystem::exists(store_->path())) << "nothing to keep, nothing made";
+  EXPECT_EQ(scalarsOfToday(), Rows{});
+  EXPECT_EQ(log_.lines, (std::vector<std::string>{"statistics store " + store_->path() +
+                                                  ": nothing has been recorded yet"}));
+
+  store_->BHClientSetValueForScalarKey("k", 1);
+  store_->BHClientSetValueForScalarKey("k", 2);
+  clock_.instant = plist::Date::since1970((kToday + 1) * 86400.0);
+  store_->BHClientSetValueForScalarKey("k", 3);
+  const auto reader = open();
+  EXPECT_EQ(scalars(*reader->initWithDefaultPath(), "", kSmallest, kLargest), Rows{});
+
+  // A reader at work keeps the log from being emptied, but not the values from being kept.
+  set({{"other", kToday, 9}});
+  log_.lines.clear();
+  const auto impatient = open(1);
+  impatient->BHClientSetValueForScalarKey("late", 4);
+  reader->initWithDefaultPath()->scalarsForKeyPrefix(
+      "other", kToday - 1, kToday, [&](std::string_view, std::int32_t, std::int64_t, bool&) {
+        impatient->BHClientCheckpoint();
+      });
+  EXPECT_EQ(log_.lines,
+            (std::vector<std::string>{"statistics store " + store_->path() +
+                                      ": other processes still use the write-ahead log: what "
+                                      "they need stays there until the next checkpoint"}));
+
+  const auto idle = reader->initWithDefaultPath();
+  store_->BHClientCheckpoint();
+  EXPECT_EQ(std::filesystem::file_size(store_->path() + "-wal"), 0U);
+  EXPECT_EQ(
+      scalars(*idle, "", kSmallest, kLargest),
+      (Rows{
+          {"k", kToday, 2}, {"k", kToday + 1, 3}, {"late", kToday + 1, 4}, {"other", kToday, 9}}));
+  store_->BHClientSetValueForScalarKey("end", 5);
+  store_.reset();
+  EXPECT_EQ(scalars(*idle, "end", kSmallest, kLargest), (Rows{{"end", kToday + 1, 5}}));
+
+  clock_.instant = plist::Date::since1970(1e300);
+  EXPECT_EQ(open()->BHDaysSince1970(), kLastDay);
+  clock_.instant = plist::Date::since1970(-0.5);
+  EXPECT_EQ(open()->BHDaysSince1970(), -1);
+}
+
+TEST_F(StoreTest, ValuesOutlastALock) {
+  set({{"k", kToday, 1}});
+  log_.lines.clear();
+  const auto impatient = open(1);
+  impatient->BHClientSetValueForScalarKey("k", 2);
+  auto writer = store_->beginBatch();
+  EXPECT_TRUE((*writer)->setScalar(kToday, "other", 1));
+  EXPECT_TRUE(impatient->commit()) << "rows that wait in memory hold nobody up";
+  impatient->BHClientSetValueForScalarKey("k", 3);
+  EXPECT_TRUE((*writer)->addScalar(kToday, "other", 1));
+  EXPECT_FALSE(impatient->commit());
+  EXPECT_EQ(log_.lines,
+            (std::vector<std::string>{"statistics store " + store_->path() +
+                                      ": database is locked: try again when the process that "
+                                      "holds it has finished; 1 values wait for the next commit"}));
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 2}})) << "readers do not wait for writers";
+  writer->reset();
+  EXPECT_TRUE(impatient->commit());
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 3}}));
+}
+
+TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
+  set({{"old", kToday, 1}});
+  for (int i = 0; i < 500; ++i)
+    store_->BHClientSetValueForScalarKey("k" + std::to_string(i), i);
+  store_->BHClientCheckpoint();
+  const std::string good = contentOf(store_->path());
+  sql("CREATE TABLE more (x); PRAGMA user_version = 2");
+  const std::string later = contentOf(store_->path());
+  std::filesystem::remove(store_->path());
+  sql("CREATE TABLE theirs (x)");
+  const std::string foreign = contentOf(store_->path());
+
+  std::string flipped = good;
+  for (std::size_t i = 4096; i < flipped.size(); i += 7)
+    flipped[i] ^= 0x55;
+  const struct {
+    const char* name;
+    std::string content;
+    bool damaged;
+    const char* reason;
+  } cases[] = {
+      {"empty", "", false, nullptr},
+      {"good", good, false, nullptr},
+      {"garbage", std::string(10'000, 'x'), true, "file is not a database"},
+      {"two bytes", "SQ", true, "file is not a database"},
+      {"half a page", good.substr(0, 300), true, "database disk image is malformed"},
+      {"cut", good.substr(0, good.size() / 2), true, "database disk image is malformed"},
+      {"flipped", flipped, true, "database disk image is malformed"},
+      {"later", later, false,
+       "has schema version 2, which this program does not know (it knows 1), and is left alone: "
+       "update tavrel, or move the file away"},
+      {"foreign", foreign, false,
+       "holds the tables of another program and is left alone: move it away"},
+  };
+  for (const auto& item : cases) {
+    for (const bool byReader : {true, false}) {
+      SCOPED_TRACE(std::string(item.name) + (byReader ? ", read" : ", written"));
+      for (const auto& file : setAsideFiles())
+        std::filesystem::remove(file);
+      for (const char* suffix : {"", "-wal", "-shm"})
+        std::filesystem::remove(store_->path() + suffix);
+      root_.write(kStorePath, item.content);
+      log_.lines.clear();
+      preferences_.values.clear();
+
+      if (byReader) {
+        scalarsOfToday();
+      } else {
+        store_->BHClientSetValueForScalarKey("new", 1);
+        store_->BHClientCheckpoint();
+      }
+      const std::string where = "statistics store " + store_->path() + ": ";
+      if (item.damaged) {
+        const std::string aside = store_->path() + ".corrupt-20261124T221320Z";
+        ASSERT_EQ(log_.lines.size(), byReader ? log_.lines.size() : 1U);
+        EXPECT_EQ(log_.lines[0], where + item.reason +
+                                     ": the file has to be set aside; it is now " + aside +
+                                     " and a new store is begun: inspect or remove that file");
+        EXPECT_EQ(contentOf(aside), item.content);
+        EXPECT_EQ(corruptions(), 1);
+      } else {
+        EXPECT_EQ(setAsideFiles(), std::vector<std::string>{});
+        EXPECT_EQ(corruptions(), 0);
+        if (item.reason) {
+          EXPECT_EQ(log_.lines[0].substr(0, (where + item.reason).size()), where + item.reason);
+          EXPECT_EQ(contentOf(store_->path()), item.content);
+        }
+      }
+      const bool kept = !item.reason || item.damaged;
+      if (!byReader) {
+        EXPECT_EQ(store_->commit(), kept);
+      }
+    }
+  }
+  // What was set while the store was another program's is still there for a store of our own.
+  std::filesystem::remove(store_->path());
+  EXPECT_TRUE(store_->commit());
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"new", kToday, 1}}));
+
+  // Who finds the damage second does not set the new store aside.
+  const StoreSite site{store_->path(), 1, clock_, preferences_, log_};
+  EXPECT_FALSE(site.setAside(FileIdentity{1, 1}, {StoreFault::Damaged, "damaged"}));
+  EXPECT_EQ(scalarsOfToday().size(), 1U);
+
+  for (const bool pipe : {true, false}) {
+    std::filesystem::remove(store_->path());
+    ASSERT_EQ(pipe ? mkfifo(store_->path().c_str(), 0600) : mkdir(store_->path().c_str(), 0700), 0);
+    log_.lines.clear();
+    EXPECT_EQ(scalarsOfToday(), Rows{});
+    EXPECT_EQ(log_.lines, (std::vector<std::string>{"statistics store " + store_->path() +
+                                                    ": is not a regular file: move it away"}));
+  }
+}
+
+TEST_F(StoreTest, AUserWhoMayOnlyReadReads) {
+  set({{"k", kToday, 1}});
+  const std::string folder = std::filesystem::path(store_->path()).parent_path();
+  const std::string rootFolder = root_.root.path("");
+  ASSERT_EQ(chmod(rootFolder.c_str(), 0755), 0);
+  // Runs as a user who owns nothing here, and yields what that user saw.
+  const auto asAnother = [&](auto action) {
+    int ends[2];
+    EXPECT_EQ(pipe(ends), 0);
+    const pid_t child = fork();
+    if (child == 0) {
+      if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
+      const std::string text = action();
+      _exit(write(ends[1], text.data(), text.size()) < 0);
+    }
+    close(ends[1]);
+    char text[1024];
+    const ssize_t size = read(ends[0], text, sizeof text);
+    close(ends[0]);
+    waitpid(child, nullptr, 0);
+    return std::string(text, size > 0 ? static_cast<std::size_t>(size) : 0);
+  };
+  const auto readAll = [&] {
+    std::string text;
+    for (const Row& row : scalarsOfToday())
+      text += row.key + "=" + std::to_string(row.value) + ";";
+    for (const std::string& line : log_.lines)
+      text += line + "\n";
+    return text;
+  };
+  ASSERT_EQ(chmod(store_->path().c_str(), 0444), 0);
+  ASSERT_EQ(chmod(folder.c_str(), 0555), 0);
+  EXPECT_EQ(asAnother(readAll), "k=1;");
+
+  // While a writer has the log open, its index is there to be read with it.
+  ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
+  ASSERT_EQ(chmod(store_->path().c_str(), 0644), 0);
+  {
+    const auto reader = store_->initWithDefaultPath();
+    EXPECT_EQ(scalars(*reader, "", kToday - 1, kToday).size(), 1U);
+    set({{"k", kToday, 2}});
+    EXPECT_EQ(asAnother(readAll), "k=2;");
+  }
+  EXPECT_EQ(asAnother([&] {
+              store_->BHClientSetValueForScalarKey("k", 3);
+              store_->commit();
+              return log_.lines.empty() ? "" : log_.lines.back();
+            }),
+            "statistics store " + store_->path() +
+                ": attempt to write a readonly database: check owner and permissions of the file "
+                "and its folder; 1 values wait for the next commit");
+  ASSERT_EQ(chmod(store_->path().c_str(), 0600), 0);
+  EXPECT_EQ(asAnother(readAll), "statistics store " + store_->path() +
+                                    ": unable to open database file (Permission denied): check "
+                                    "owner and permissions of the file and its folder\n");
+}
+
+// A writer whose every transaction adds one to a scalar and three values to a distribution, and
+// tells when it has been committed.
+[[noreturn]] void writeForEver(SqliteStore& store, int acknowledgements, int transactions) {
+  for (int i = 0; i < transactions; ++i) {
+    auto batch = store.beginBatch();
+    if (!batch) _exit(1);
+    for (int value = 0; value < 3; ++value) {
+      if (!(*batch)->appendValue(kToday, "d", 0, getpid())) _exit(2);
+    }
+    if (!(*batch)->addScalar(kToday, "n", 1) || !(*batch)->commit()) _exit(3);
+    if (write(acknowledgements, ".", 1) != 1) _exit(4);
+  }
+  _exit(0);
+}
+
+TEST_F(StoreTest, NothingIsLostWhenWritersAreKilled) {
+  std::int64_t expected = 0;
+  for (int round = 0; round < 40; ++round) {
+    int ends[2];
+    ASSERT_EQ(pipe(ends), 0);
+    const pid_t child = fork();
+    if (child == 0) writeForEver(*store_, ends[1], 1 << 20);
+    close(ends[1]);
+    // Killed at another place of a transaction each time; in the first rounds while the store is
+    // being made.
+    int acknowledged = 0;
+    char byte;
+    while (acknowledged < round % 7 && read(ends[0], &byte, 1) == 1)
+      ++acknowledged;
+    for (std::atomic<int> spin = 0; spin < (round % 10) * 20'000;)
+      ++spin;
+    kill(child, SIGKILL);
+    waitpid(child, nullptr, 0);
+    while (read(ends[0], &byte, 1) == 1)
+      ++acknowledged;
+    close(ends[0]);
+
+    std::int64_t kept = 0;
+    std::size_t values = 0;
+    const auto history = store_->initWithDefaultPath();
+    for (const Row& row : scalars(*history, "n", kToday - 1, kToday))
+      kept = row.value;
+    history->distributionsForKeyPrefix(
+        "", kToday - 1, kToday,
+        [&](std::string_view, std::int32_t, BHHistoryDistributionEnumerator& all, bool&) {
+          values = take(all).size();
+        });
+    ASSERT_GE(kept, expected + acknowledged);
+    ASSERT_LE(kept, expected + acknowledged + 1);
+    ASSERT_EQ(values, static_cast<std::size_t>(kept) * 3);
+    expected = kept;
+  }
+  EXPECT_GT(expected, 100);
+  EXPECT_EQ(corruptions(), 0);
+}
+
+TEST_F(StoreTest, NothingIsLostAmongSeveralWriters) {
+  constexpr int kWriters = 5;
+  constexpr int kTransactions = 40;
+  int ends[2];
+  ASSERT_EQ(pipe(ends), 0);
+  for (int writer = 0; writer < kWriters; ++writer) {
+    if (fork() == 0) writeForEver(*store_, ends[1], kTransactions);
+  }
+  for (int writer = 0; writer < kWriters; ++writer) {
+    int status = 0;
+    wait(&status);
+    EXPECT_EQ(status, 0);
+  }
+  close(ends[0]);
+  close(ends[1]);
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"n", kToday, kWriters * kTransactions}}));
+  std::map<double, int> perWriter;
+  store_->initWithDefaultPath()->distributionsForKeyPrefix(
+      "d", kToday - 1, kToday,
+      [&](std::string_view, std::int32_t, BHHistoryDistributionEnumerator& values, bool&) {
+        for (const Sample& sample : take(values))
+          ++perWriter[sample.value];
+      });
+  ASSERT_EQ(perWriter.size(), static_cast<std::size_t>(kWriters));
+  for (const auto& [writer, count] : perWriter)
+    EXPECT_EQ(count, 3 * kTransactions) << writer;
+  EXPECT_EQ(sql("SELECT count(*) FROM chunks"), (std::vector<std::string>{"1"}));
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,161 @@
+#include "platform/submission.h"
+
+#include <filesystem>
+#include <gtest/gtest.h>
+#include <set>
+
+#include "faulty_file_layer.h"
+#include "fixed_clock.h"
+#include "platform/linux/file_preferences.h"
+#include "platform/linux/file_submission.h"
+#include "platform/linux/json_line.h"
+#include "platform/plist/coding.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+using Place = FileSubmission::Place;
+
+const std::string kContent(10'000, 'L');
+
+struct Service {
+  Service(const DeviceRoot& root, FileLayer& layer)
+      : version(root, layer, propertyLists, log),
+        preferences(root, layer, propertyLists, clock, log),
+        submission(root, layer, propertyLists, preferences, version, clock, log) {}
+  explicit Service(const DeviceRoot& root) : Service(root, ownFiles) {}
+
+  bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
+    return submission.ZTXWriteLogForSubmission("193", name, options, [](LogFile& file) {
+      file.write(asBytes(std::string_view(kContent).substr(0, 6000)));
+      file.write(asBytes(std::string_view(kContent).substr(6000)));
+    });
+  }
+
+  QuickFileLayer ownFiles;
+  plist::PlistCoding propertyLists;
+  FixedClock clock;
+  KeptLog log;
+  LinuxSystemVersion version;
+  FilePreferences preferences;
+  FileSubmission submission;
+};
+
+void describeSystem(const TemporaryRoot& device) {
+  device.write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
+}
+
+std::size_t filesIn(const TemporaryRoot& device, std::string_view place) {
+  const fs::path folder =
+      device.root.path("/var/mobile/Library/Logs/Submission/" + std::string(place));
+  std::error_code missing;
+  const auto count = std::distance(fs::directory_iterator(folder, missing), {});
+  return missing ? 0 : static_cast<std::size_t>(count);
+}
+
+TEST(Submission, AsksThePreferences) {
+  const TemporaryRoot device;
+  Service service(device.root);
+  EXPECT_FALSE(service.submission.isDiagnosticSubmissionEnabled());
+  EXPECT_FALSE(service.submission.hasInternalDiagnostics("com.example.program"));
+  EXPECT_TRUE(service.submission.ZTXGetDATaskingValue("AggressiveSubmissionDays").isNull());
+  service.preferences.ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
+                                             "com.norvane.zentrix");
+  service.preferences.ZTXPreferencesSetValue("com.example.program", true, "com.norvane.zentrix");
+  service.preferences.ZTXPreferencesSetValue("AggressiveSubmissionDays", 3, "com.norvane.da");
+  EXPECT_TRUE(service.submission.isDiagnosticSubmissionEnabled());
+  EXPECT_TRUE(service.submission.hasInternalDiagnostics("com.example.program"));
+  EXPECT_EQ(service.submission.ZTXGetDATaskingValue("AggressiveSubmissionDays"), plist::Value(3));
+}
+
+TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
+  const TemporaryRoot device;
+  describeSystem(device);
+  Service service(device.root);
+  ASSERT_TRUE(service.file("log-tallied", {{"previous_os_version", "<unknown>"}}));
+  service.clock.time = plist::Date::since1970(1'795'802'600);
+  ASSERT_TRUE(service.file("../Storage Status"));
+
+  const auto logs = *service.submission.logs(Place::Pending);
+  ASSERT_EQ(logs.size(), 2U);
+  EXPECT_EQ(logs[0].name.substr(0, 29), "log-tallied-20261127T180218Z-");
+  EXPECT_EQ(logs[1].name.substr(0, 36), "_.._Storage_Status-20261127T180320Z-");
+  EXPECT_EQ(*service.ownFiles.read(logs[0].path, kContent.size()), kContent);
+  const std::string expected =
+      R"j({"LogName":"log-tallied","LogType":"193","OSVersion":"Example OS 4.2 (8N5)",)j"
+      R"j("Options":{"previous_os_version":"<unknown>"},"Time":"2026-11-27T18:02:18.000Z"})j";
+  std::string metadata;
+  appendJson(metadata, logs[0].metadata);
+  EXPECT_EQ(metadata, expected);
+  EXPECT_FALSE(logs[1].metadata.contains("Options"));
+  EXPECT_EQ(filesIn(device, "pending"), 4U);
+
+  service.submission.submitDiagnosticLogs();
+  EXPECT_EQ(filesIn(device, "pending"), 0U);
+  service.submission.submitDiagnosticLogs();
+  const auto sent = *service.submission.logs(Place::Outbox);
+  ASSERT_EQ(sent.size(), 2U);
+  EXPECT_EQ(sent[1].metadata.string("LogName"), "../Storage Status");
+  EXPECT_TRUE(service.log.lines.empty());
+}
+
+TEST(Submission, RemovesMetadataOfAProcessThatWasKilled) {
+  const TemporaryRoot device;
+  Service service(device.root);
+  const std::string pending = "/var/mobile/Library/Logs/Submission/pending/";
+  for (const std::string name : {"old", "young"})
+    device.write(pending + name + ".metadata.plist", "x");
+  fs::last_write_time(device.root.path(pending + "old.metadata.plist"),
+                      fs::file_time_type::clock::now() - std::chrono::hours(25));
+  ASSERT_TRUE(service.file());
+  EXPECT_FALSE(fs::exists(device.root.path(pending + "old.metadata.plist")));
+  EXPECT_TRUE(fs::exists(device.root.path(pending + "young.metadata.plist")));
+  EXPECT_EQ(service.submission.logs(Place::Pending)->size(), 1U);
+}
+
+TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
+  for (const auto fault : FaultyFileLayer::kFaults) {
+    int call = 1;
+    for (bool struck = true; struck; ++call) {
+      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
+      const TemporaryRoot device;
+      describeSystem(device);
+      FaultyFileLayer faulty(device.root.path("/"), fault, call);
+      Service service(device.root, faulty);
+      const bool filed = service.file();
+      if (!filed) {
+        ASSERT_FALSE(service.log.lines.empty());
+        EXPECT_EQ(service.log.lines.back().find("log \"log-tallied\" is not filed: cannot "), 0U);
+        if (faulty.goesOn()) {
+          EXPECT_EQ(filesIn(device, "pending"), 0U) << "nothing of it is left";
+        }
+      }
+      service.submission.submitDiagnosticLogs();
+      struck = faulty.hasStruck();
+      faulty.settle();
+
+      Service after(device.root);
+      std::set<std::string> names;
+      for (const Place place : {Place::Pending, Place::Outbox}) {
+        const auto logs = *after.submission.logs(place);
+        for (const auto& log : logs) {
+          EXPECT_EQ(*after.ownFiles.read(log.path, 20'000), kContent);
+          EXPECT_EQ(log.metadata.string("LogType"), "193");
+          names.insert(log.name);
+        }
+      }
+      EXPECT_TRUE(names.size() == 1 || (!filed && names.empty())) << "what was filed stays";
+
+      EXPECT_TRUE(after.file());
+      after.submission.submitDiagnosticLogs();
+      EXPECT_EQ(after.submission.logs(Place::Pending)->size(), 0U);
+      EXPECT_EQ(after.submission.logs(Place::Outbox)->size(), names.size() + 1);
+      ASSERT_LT(call, 200);
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tavrel
