@@ -1,0 +1,305 @@
+// tavrelctl as a whole: usage, preferences, property lists, logs, status.
+#include <gtest/gtest.h>
+
+#include "base/format.h"
+#include "device.h"
+#include "platform/plist/coding.h"
+
+namespace tavrel {
+namespace {
+
+constexpr const char* kPending = "/var/mobile/Library/Logs/Submission/pending/";
+
+nlohmann::json jsonOf(const Outcome& outcome) {
+  EXPECT_EQ(outcome.status, 0) << outcome;
+  const auto json = nlohmann::json::parse(outcome.out, nullptr, false);
+  EXPECT_EQ(json.value("format_version", 0), 1) << outcome;
+  return json;
+}
+
+TEST(Usage, MistakesEndWithStatus2AndOneLine) {
+  const TemporaryDevice device;
+  const struct {
+    std::vector<std::string> arguments;
+    std::string error;
+  } kCases[] = {
+      {{}, "tavrelctl: A subcommand is required: see 'tavrelctl --help'\n"},
+      {{"log"}, "tavrelctl: A subcommand is required: see 'tavrelctl log --help'\n"},
+      {{"prefs", "get", "a"}, "tavrelctl: KEY is required: see 'tavrelctl prefs get --help'\n"},
+      {{"prefs", "get", "../a", "k"},
+       "tavrelctl: not a preference domain: ../a: give a name such as com.example.app, without "
+       "slashes\n"},
+      {{"log", "preview", "--day", "soon"},
+       "tavrelctl: not a day: soon: give a 32-bit day number or YYYY-MM-DD\n"},
+      {{"prefs", "set", "a", "k", "1", "--int", "--bool"}, ""},
+      {{"log", "show", "--raw", "--json"}, ""},
+      {{"status", "--wrong"}, ""},
+  };
+  for (const auto& [arguments, error] : kCases) {
+    const Outcome outcome = device.run(arguments);
+    EXPECT_EQ(outcome.status, 2) << outcome;
+    EXPECT_EQ(outcome.out, "");
+    EXPECT_EQ(std::count(outcome.error.begin(), outcome.error.end(), '\n'), 1) << outcome;
+    if (!error.empty()) {
+      EXPECT_EQ(outcome.error, error);
+    }
+  }
+  EXPECT_EQ(device.run({"--version"}), prints("tavrelctl 0.1.0\n"));
+  for (const std::vector<std::string>& help :
+       {std::vector<std::string>{"--help"}, {"prefs", "set", "--help"}, {"log", "--help"}}) {
+    const Outcome outcome = device.run(help);
+    EXPECT_EQ(outcome.status, 0) << outcome;
+    EXPECT_NE(outcome.out.find("Usage: "), std::string::npos) << outcome;
+  }
+}
+
+TEST(Prefs, KeepTheKindThatWasAskedFor) {
+  const TemporaryDevice device;
+  const struct {
+    std::string kind;
+    std::string text;
+    std::string shown;
+    std::string json;
+  } kCases[] = {
+      {"--string", "a b", "a b\n", R"("a b")"},
+      {"--bool", "yes", "true\n", "true"},
+      {"--int", "-9223372036854775808", "-9223372036854775808\n", "-9223372036854775808"},
+      {"--int", "18446744073709551615", "18446744073709551615\n", "18446744073709551615"},
+      {"--float", "1e3", "1000.0\n", "1000.0"},
+      {"--float", "-inf", "-inf\n", R"({"$real":"-inf"})"},
+      {"--date", "2026-11-16", "2026-11-16 00:00:00 +0000\n",
+       R"({"$date":"2026-11-16T00:00:00Z"})"},
+      {"--plist", R"({"b": [1], "a": {"$data": "/w=="}})", "a = <ff>\nb:\n  [0] = 1\n",
+       R"({"a":{"$data":"/w=="},"b":[1]})"},
+  };
+  for (const auto& [kind, text, shown, json] : kCases) {
+    EXPECT_EQ(device.run({"prefs", "set", kind, "com.example.a", "key", "--", text}), prints(""));
+    EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "key"}), prints(shown));
+    EXPECT_EQ(
+        jsonOf(device.run({"prefs", "get", "com.example.a", "key", "--json"}))["value"].dump(),
+        json);
+  }
+  EXPECT_EQ(device.run({"prefs", "set", "com.example.a", "flag", "true"}),
+            (Outcome{0, "", "tavrelctl: stored as a string: true: use --bool for a boolean\n"}));
+  EXPECT_EQ(device.run({"prefs", "set", "com.example.a", "n", "1x", "--int"}),
+            (Outcome{2, "",
+                     "tavrelctl: not an integer: 1x: give a decimal number of at most 64 bits\n"}));
+  EXPECT_EQ(device.run({"prefs", "list", "com.example.a"}),
+            prints("KEY   TYPE        VALUE\n"
+                   "flag  string      \"true\"\n"
+                   "key   dictionary  {\"a\": \"<ff>\", \"b\": [1]}\n"));
+  EXPECT_EQ(device.run({"prefs", "list"}), prints("com.example.a\n"));
+  EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), prints(""));
+  const Outcome absent{1, "",
+                       "tavrelctl: no preference key in domain com.example.a: 'tavrelctl prefs "
+                       "list com.example.a' shows what there is\n"};
+  EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), absent);
+  EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "key"}), absent);
+}
+
+TEST(Plist, ConvertsBetweenAllForms) {
+  const TemporaryDevice device;
+  const std::string json = "{\n  \"a\": [\n    1,\n    2.5\n  ],\n  \"b\": true\n}\n";
+  const Outcome binary = device.run({"plist", "convert", "-", "--to", "binary"}, json);
+  EXPECT_TRUE(binary.out.starts_with("bplist00")) << binary;
+  const Outcome xml = device.run({"plist", "convert", "-"}, binary.out);
+  EXPECT_EQ(xml, prints(xmlOf(json)));
+  EXPECT_EQ(device.run({"plist", "convert", "-", "--to", "json"}, xml.out), prints(json));
+
+  const std::string file = device.path("/out.plist");
+  EXPECT_EQ(device.run({"plist", "convert", "-", "-o", file}, json), prints(""));
+  EXPECT_EQ(device.run({"plist", "show", file}), prints("a:\n  [0] = 1\n  [1] = 2.5\nb = true\n"));
+  EXPECT_EQ(jsonOf(device.run({"plist", "show", file, "--json"}))["value"],
+            nlohmann::json::parse(json));
+
+  EXPECT_EQ(device.run({"plist", "convert", "-", "-o", "/dev/null"}, json),
+            (Outcome{1, "",
+                     "tavrelctl: cannot write /dev/null: it is no regular file: use -o - and "
+                     "redirect\n"}));
+  EXPECT_EQ(device.run({"plist", "show", "-"}, "[1,"),
+            (Outcome{1, "",
+                     "tavrelctl: standard input: parse error at line 1, column 4: syntax error "
+                     "while parsing value - unexpected end of input; expected '[', '{', or a "
+                     "literal\n"}));
+}
+
+// A whitelist, and a day's statistics of which one scalar may not leave.
+void fill(const TemporaryDevice& device) {
+  device.write(kWhitelistFile, xmlOf(R"({"G": {
+      "ScalarKeys": {"app.starts": {"sig_fig": 2},
+                     "com.norvane.zentrix.bhd.database.corruptions": {}},
+      "DistributionKeys": {"app.load": {"intervals": [2, 3]}}}})"));
+  const Outcome imported = device.run({"stat", "import", "-"},
+                                      "scalar\t20000\tapp.starts\t12345\n"
+                                      "scalar\t20000\tapp.secret\t7\n"
+                                      "value\t20000\tapp.load\t1\t1\n"
+                                      "value\t20000\tapp.load\t2\t2\n"
+                                      "value\t20000\tapp.load\t3\t3\n"
+                                      "value\t20000\tapp.load\t4\t4\n");
+  EXPECT_EQ(imported.status, 0) << imported;
+  device.run({"prefs", "set", "com.norvane.tallied", "DatabaseCorruptionCount", "3", "--int"});
+}
+
+TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
+  const TemporaryDevice device;
+  fill(device);
+  const auto before = device.files();
+  const Outcome xml = device.run({"log", "preview", "--day", "20000"});
+  EXPECT_EQ(xml.status, 0) << xml;
+  EXPECT_EQ(xml.error, "");
+  const auto document = plist::read(asBytes(xml.out));
+  ASSERT_TRUE(document) << xml;
+  const plist::Dictionary log = document->dictionary();
+  EXPECT_EQ(log.get("BHScalars"),
+            plist::Value(plist::Dictionary{{"app.starts", 12000},
+                                           {"com.norvane.zentrix.bhd.database.corruptions", 3}}));
+  EXPECT_EQ(log.get("BHStartDate"), plist::Value(plist::Date::ofDay(20000)));
+
+  const auto json = jsonOf(device.run({"log", "preview", "--day", "2024-10-04", "--json"}))["log"];
+  EXPECT_EQ(json["day"], 20000);
+  EXPECT_EQ(json["type"], "193");
+  EXPECT_EQ(json["options"], nlohmann::json::parse(R"({"previous_os_version": "<unknown>"})"));
+  EXPECT_EQ(json["distributions"], nlohmann::json::parse(R"json({"app.load": {
+      "count": 4, "minimum": 1.0, "maximum": 4.0, "mean": 2.5, "sum_of_squared_deviations": 5.0,
+      "standard_deviation": 1.118033988749895,
+      "histogram": [{"bucket": "(-inf, 2]", "count": 2}, {"bucket": "(2, 3]", "count": 1},
+                    {"bucket": "(3, inf)", "count": 1}]}})json"));
+
+  EXPECT_EQ(device.run({"log", "preview", "--day", "19999"}),
+            (Outcome{1, "",
+                     "tavrelctl: no log would be submitted for day 19999 (2024-10-03): no "
+                     "whitelisted key has a value on that day\n"}));
+  const Outcome verbose = device.run({"log", "preview", "--day", "20000", "-v"});
+  EXPECT_EQ(verbose.out.size(), xml.out.size());
+  EXPECT_NE(verbose.error.find("info: writing tallied log. yesterday=20000\n"), std::string::npos)
+      << verbose.error;
+  EXPECT_EQ(device.files(), before);
+
+  std::filesystem::remove(device.path(kWhitelistFile));
+  EXPECT_EQ(device.run({"log", "preview", "--day", "20000"}).error,
+            "tavrelctl: no log would be submitted for day 20000 (2024-10-04): Couldn't load "
+            "whitelist\n");
+
+  fill(device);
+  const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+  device.write(store, "not a database, and long enough to be taken for a damaged one");
+  const auto damaged = device.files();
+  const Outcome outcome = device.run({"log", "preview", "--day", "20000"});
+  EXPECT_EQ(outcome.status, 1);
+  EXPECT_TRUE(outcome.error.ends_with("; the next run sets it aside\n")) << outcome;
+  EXPECT_EQ(device.files(), damaged);
+}
+
+TEST(LogShow, DrawsTheTableOfASubmittedLog) {
+  const TemporaryDevice device;
+  EXPECT_EQ(device.run({"log", "list"}), prints(""));
+  EXPECT_EQ(device.run({"log", "show"}).status, 1);
+
+  const std::string log = xmlOf(R"json({
+    "BHCrashLogVersion": 1,
+    "BHStartDate": {"$date": "2024-10-04T00:00:00Z"},
+    "BHLogCreationDate": {"$date": "2024-10-05T03:00:00Z"},
+    "BHMetadata": {"BHUserInterfaceLanguage": "de"},
+    "BHScalars": {"app.starts": 12000, "app.x": -7},
+    "BHDistributions": {"app.load": [1.0, 4.0, 2.5, 5.0, 4], "app.none": [0.0, 0.0, 0.0, 0.0, 0]},
+    "BHDistributionsHistogram": {"app.load": {"(100, inf)": 1, "(20, 100]": 4, "(-inf, 20]": 8}},
+    "BHTasking": [],
+    "BHTaskID": "(no tasking id)",
+    "BHTaskDigest": "(no tasking digest)",
+    "BHWhitelistDigest": "0123456789abcdef0123456789abcdef",
+    "BHActivatedAppInfo": [{"bundle_id": "org.example.app"}]
+  })json");
+  device.write(std::string(kPending) + "log-tallied-b.log", log);
+  device.write(std::string(kPending) + "log-tallied-b.metadata.plist", xmlOf(R"json({
+    "LogType": "193", "LogName": "log-tallied", "OSVersion": "Ostara 4 (8B)",
+    "Time": {"$date": "2024-10-05T03:00:01Z"}})json"));
+  device.write(std::string(kPending) + "StorageStatus-a.log", "line\x1b one\n\nline two");
+  device.write(std::string(kPending) + "StorageStatus-a.metadata.plist", xmlOf(R"({
+    "LogType": "165", "LogName": "StorageStatus", "Time": {"$date": "2024-10-04T03:00:01Z"}})"));
+
+  EXPECT_EQ(device.run({"log", "list"}),
+            prints(format(
+                "PLACE    FILED                 TYPE  NAME           BYTES  FILE\n"
+                "pending  2024-10-04T03:00:01Z  165   StorageStatus     19  StorageStatus-a.log\n"
+                "pending  2024-10-05T03:00:01Z  193   log-tallied     %zu  log-tallied-b.log\n",
+                log.size())));
+  EXPECT_EQ(device.run({"log", "show"}, "", 60),
+            prints("Log           " + device.path(kPending) + R"(log-tallied-b.log (pending)
+Type          193
+Name          log-tallied
+Filed         2024-10-05 03:00:01 +0000
+OS version    Ostara 4 (8B)
+Day           20000 (2024-10-04)
+Created       2024-10-05 03:00:00 +0000
+Version       1
+Whitelist     0123456789abcdef0123456789abcdef
+Tasking       (no tasking id)
+Task digest   (no tasking digest)
+Settings      0
+
+Metadata (1)
+  BHUserInterfaceLanguage  de
+
+Scalars (2)
+  app.starts  12000
+  app.x          -7
+
+Distributions (2)
+  KEY       COUNT  MINIMUM  MAXIMUM  MEAN  STD DEVIATION
+  app.load      4        1        4   2.5     1.11803399
+  app.none      0        0        0     0              -
+
+Histogram of app.load
+  (-inf, 20]  8  ########################################
+  (20, 100]   4  ####################
+  (100, inf)  1  #####
+
+Activated applications (1)
+  {"bundle_id": "org.example.app"}
+)"));
+  EXPECT_EQ(device.run({"log", "show", "--raw", "log-tallied-b"}), prints(log));
+  EXPECT_EQ(device.run({"log", "show", "StorageStatus-a.log"}),
+            prints("Log           " + device.path(kPending) +
+                   "StorageStatus-a.log (pending)\n"
+                   "Type          165\n"
+                   "Name          StorageStatus\n"
+                   "Filed         2024-10-04 03:00:01 +0000\n"
+                   "\n"
+                   "line\\x1b one\n\nline two\n"));
+  const auto json = jsonOf(device.run({"log", "show", "--json"}))["log"];
+  EXPECT_EQ(json["scalars"], nlohmann::json::parse(R"({"app.starts": 12000, "app.x": -7})"));
+  EXPECT_EQ(json["distributions"]["app.none"]["standard_deviation"], nullptr);
+  EXPECT_EQ(json["created"], "2024-10-05T03:00:00Z");
+}
+
+TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
+  const TemporaryDevice device;
+  const auto fresh = jsonOf(device.run({"status", "--json"}));
+  EXPECT_EQ(fresh["submission_allowed"], false);
+  EXPECT_EQ(fresh["last_reported_day"], nullptr);
+  EXPECT_EQ(fresh["store"]["bytes"], nullptr);
+  EXPECT_EQ(fresh["pending_logs"], 0);
+
+  fill(device);
+  device.run(
+      {"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionEnabled", "true", "--bool"});
+  device.run({"prefs", "set", "com.norvane.tallied.tavrel",
+              "LastCrashLogSerializationDateInDaysSince1970", "20001", "--int"});
+  device.write(std::string(kPending) + "x.log", "text");
+  const auto bytes =
+      std::filesystem::file_size(device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb"));
+  const Outcome outcome = device.run({"status"});
+  EXPECT_EQ(outcome.status, 0) << outcome;
+  for (const std::string& line :
+       {std::string("Submission         allowed\n"),
+        std::string("Last reported day  20001 (2024-10-05)\n"),
+        std::string("Last OS version    none yet\n"),
+        format("Store              %llu bytes, 1 day held: 20000 (2024-10-04)\n",
+               std::uint64_t{bytes}),
+        std::string("Pending logs       1\n")}) {
+    EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,92 @@
+// A device in a temporary folder, and tavrelctl on it.
+#pragma once
+
+#include <algorithm>
+#include <filesystem>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <sstream>
+#include <stdlib.h>
+#include <string>
+#include <vector>
+
+#include "platform/plist/xml.h"
+#include "tools/json_value.h"
+#include "tools/tavrelctl.h"
+
+namespace tavrel {
+
+inline constexpr const char* kWhitelistFile =
+    "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
+
+/// A property list in its XML form, written here as JSON.
+inline std::string xmlOf(std::string_view json) {
+  const auto value = parseJsonValue(json);
+  EXPECT_TRUE(value) << value.error().message;
+  return *plist::writeXml(*value);
+}
+
+struct Outcome {
+  int status;
+  std::string out;
+  std::string error;
+
+  bool operator==(const Outcome&) const = default;
+  friend std::ostream& operator<<(std::ostream& stream, const Outcome& outcome) {
+    return stream << "status " << outcome.status << "\n--- out\n"
+                  << outcome.out << "--- error\n"
+                  << outcome.error << "---";
+  }
+};
+
+/// `out` alone, with status 0.
+inline Outcome prints(std::string out) {
+  return {0, std::move(out), {}};
+}
+
+class TemporaryDevice {
+ public:
+  TemporaryDevice() {
+    std::string name = (std::filesystem::temp_directory_path() / "tavrel-device-XXXXXX").string();
+    root_ = ::mkdtemp(name.data());
+  }
+  ~TemporaryDevice() { std::filesystem::remove_all(root_); }
+  TemporaryDevice(const TemporaryDevice&) = delete;
+  TemporaryDevice& operator=(const TemporaryDevice&) = delete;
+
+  std::string path(const std::string& devicePath) const { return root_.string() + devicePath; }
+
+  void write(const std::string& devicePath, const std::string& content) const {
+    std::filesystem::create_directories(std::filesystem::path(path(devicePath)).parent_path());
+    std::ofstream(path(devicePath), std::ios::binary) << content;
+  }
+
+  /// Every file below the root with its content, so that "nothing has changed" can be seen.
+  std::vector<std::pair<std::string, std::string>> files() const {
+    std::vector<std::pair<std::string, std::string>> list;
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(root_)) {
+      if (!entry.is_regular_file()) continue;
+      std::ostringstream content;
+      content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
+      list.emplace_back(entry.path().string(), content.str());
+    }
+    std::sort(list.begin(), list.end());
+    return list;
+  }
+
+  Outcome run(std::vector<std::string> arguments, const std::string& input = {},
+              std::optional<std::size_t> columns = std::nullopt) const {
+    std::istringstream in(input);
+    std::ostringstream out;
+    std::ostringstream error;
+    arguments.insert(arguments.begin(), {"--root", root_.string()});
+    const int status =
+        runTavrelctl(arguments, {.in = in, .out = out, .error = error, .columns = columns});
+    return {status, out.str(), error.str()};
+  }
+
+ private:
+  std::filesystem::path root_;
+};
+
+}  // namespace tavrel

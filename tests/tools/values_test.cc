@@ -1,0 +1,191 @@
+// The small parts of the tool: values as JSON, days, dates, tables.
+#include <cmath>
+#include <gtest/gtest.h>
+#include <limits>
+#include <sstream>
+
+#include "tools/base64.h"
+#include "tools/day_argument.h"
+#include "tools/distribution_view.h"
+#include "tools/json_value.h"
+#include "tools/table.h"
+#include "tools/value_text.h"
+
+namespace tavrel {
+namespace {
+
+TEST(JsonValue, EveryValueReadsBackEqual) {
+  const plist::Value everything = plist::Dictionary{
+      {"least", std::numeric_limits<std::int64_t>::min()},
+      {"most", std::numeric_limits<std::uint64_t>::max()},
+      {"beyond doubles", std::int64_t{9007199254740993}},
+      {"real", 2.0},
+      {"tenth", 0.1},
+      {"negative zero", -0.0},
+      {"inf", -HUGE_VAL},
+      {"nan", std::nan("")},
+      {"yes", true},
+      {"text", "tab\t quote\" ü"},
+      {"bytes", plist::Data(asBytes("\x01\xff\x02\x03"))},
+      {"date", plist::Date::since1970(1794851738.25)},
+      {"array", plist::Array{1, plist::Array::create(), plist::Dictionary::create()}},
+      {"$data", "no bytes"},
+      {"$$", 1},
+  };
+  const std::string text = jsonOf(everything).dump();
+  EXPECT_NE(text.find(R"("$$data":"no bytes","array":[1,[],{}],"beyond doubles":9007199254740993)"),
+            std::string::npos)
+      << text;
+  EXPECT_NE(text.find(R"("bytes":{"$data":"Af8CAw=="},"date":{"$date":"2026-11-16T17:55:38.25Z"})"),
+            std::string::npos)
+      << text;
+  const auto back = parseJsonValue(text);
+  ASSERT_TRUE(back) << back.error().message;
+  EXPECT_EQ(*back, everything);
+  EXPECT_TRUE(std::signbit(back->dictionary().number("negative zero")->real()));
+  EXPECT_TRUE(back->dictionary().number("real")->isFloating());
+}
+
+TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
+  const struct {
+    std::string text;
+    std::string message;
+  } kCases[] = {
+      {R"({"a": {"b": null}})", "JSON/a/b: null has no place in a property list"},
+      {"18446744073709551616", "JSON: the integer 18446744073709551616 does not fit 64 bits"},
+      {R"({"$data": "?"})", "JSON/$data: \"$data\" is no base64"},
+      {R"({"$real": "1"})", "JSON/$real: \"$real\" is none of \"nan\", \"inf\", \"-inf\""},
+      {R"({"$date": "today"})",
+       "JSON/$date: not a date: today: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD"},
+      {R"({"$data": "", "x": 1})", "JSON/x: \"$data\" stands alone in its object and holds a text"},
+      {R"({"$x": 1})", "JSON/$x: \"$x\" is no known form: write a key that begins with $ as $$"},
+      {std::string(200, '['), "JSON: nested too deeply"},
+  };
+  for (const auto& [text, message] : kCases) {
+    const auto value = parseJsonValue(text);
+    ASSERT_FALSE(value) << text;
+    EXPECT_EQ(value.error().message, message);
+  }
+  const auto cut = parseJsonValue("{\"a\":\n [1,");
+  ASSERT_FALSE(cut);
+  EXPECT_NE(cut.error().message.find("line 2, column 5"), std::string::npos) << cut.error().message;
+}
+
+TEST(Base64, RefusesWrongLengthsAndPadding) {
+  for (const std::string_view text :
+       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="}) {
+    EXPECT_FALSE(parseBase64(text)) << text;
+  }
+  for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
+    std::vector<std::byte> bytes(size);
+    for (std::size_t i = 0; i < size; ++i)
+      bytes[i] = static_cast<std::byte>(255 - i);
+    EXPECT_EQ(parseBase64("\n " + base64Text(bytes)), bytes);
+  }
+}
+
+TEST(Dates, AreReadAsTheyAreWritten) {
+  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
+    const auto date = plist::Date::sinceEpoch(seconds);
+    const auto back = parseIsoDate(isoDateText(date));
+    ASSERT_TRUE(back) << back.error().message;
+    EXPECT_EQ(*back, date) << isoDateText(date);
+  }
+  for (const std::string_view text :
+       {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
+        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"}) {
+    EXPECT_FALSE(parseIsoDate(text)) << text;
+  }
+}
+
+TEST(Days, AreNumbersOrDates) {
+  const struct {
+    std::string_view text;
+    std::int32_t day;
+    std::string_view shown;
+  } kCases[] = {
+      {"0", 0, "0 (1970-01-01)"},
+      {"2026-11-16", 20773, "20773 (2026-11-16)"},
+      {"-1", -1, "-1 (1969-12-31)"},
+      {"2147483647", 2147483647, "2147483647 (5881580-07-11)"},
+      {"-2147483648", std::numeric_limits<std::int32_t>::min(), "-2147483648 (-5877641-06-23)"},
+  };
+  for (const auto& [text, day, shown] : kCases) {
+    const auto parsed = parseDay(text);
+    ASSERT_TRUE(parsed) << text;
+    EXPECT_EQ(*parsed, day);
+    EXPECT_EQ(dayText(day), shown);
+  }
+  for (const std::string_view text : {"", "1x", "2147483648", "2026-02-30", "5881580-07-12"}) {
+    ASSERT_FALSE(parseDay(text)) << text;
+  }
+  EXPECT_EQ(parseDay("1x").error().message,
+            "not a day: 1x: give a 32-bit day number or YYYY-MM-DD");
+}
+
+TEST(Table, AlignsAndCutsTheWidestColumn) {
+  Table table({{"KEY"}, {"N", Table::Align::Right}}, 2);
+  table.add({"ü", "1"});
+  table.add({"a\x1b[31m\n\xff\xe2\x80\xae", "10"});
+  table.add({"a long key indeed", "100"});
+  const auto print = [&](std::optional<std::size_t> columns) {
+    std::ostringstream out;
+    table.print(out, columns);
+    return out.str();
+  };
+  EXPECT_EQ(print(std::nullopt),
+            "  KEY                            N\n"
+            "  ü                              1\n"
+            "  a\\x1b[31m\\n\\xff\\xe2\\x80\\xae   10\n"
+            "  a long key indeed            100\n");
+  EXPECT_EQ(print(20),
+            "  KEY              N\n"
+            "  ü                1\n"
+            "  a\\x1b[31m\\n\\…   10\n"
+            "  a long key i…  100\n");
+  EXPECT_EQ(bar(1, 1000000, 40), "#");
+  EXPECT_EQ(bar(20, 40, 40), std::string(20, '#'));
+  EXPECT_EQ(bar(0, 40, 40), "");
+}
+
+TEST(DistributionView, OrdersBucketsByTheirEndsAndPassesOverWhatIsNoSummary) {
+  const plist::Dictionary log{
+      {"BHDistributions", plist::Dictionary{{"b", plist::Array{1.0, 4.0, 2.5, 5.0, 4}},
+                                            {"a", plist::Array{0.0, 0.0, 0.0, 0.0, 0}},
+                                            {"short", plist::Array{1.0}},
+                                            {"text", plist::Array{"x", 4.0, 2.5, 5.0, 4}}}},
+      {"BHDistributionsHistogram", plist::Dictionary{{"b", plist::Dictionary{{"(100, inf)", 1},
+                                                                             {"(20, 100]", 4},
+                                                                             {"odd", 9},
+                                                                             {"(-inf, 3]", 2},
+                                                                             {"(3, 20]", 3}}}}}};
+  const auto views = distributionsOf(log);
+  ASSERT_EQ(views.size(), 2U);
+  EXPECT_EQ(views[0].key, "a");
+  EXPECT_FALSE(views[0].standardDeviation());
+  EXPECT_EQ(*views[1].standardDeviation(), std::sqrt(1.25));
+  std::string order;
+  for (const auto& bucket : views[1].buckets)
+    order += bucket.label + ' ';
+  EXPECT_EQ(order, "(-inf, 3] (3, 20] (20, 100] (100, inf) odd ");
+}
+
+TEST(ValueText, ShowsTheKindOfAValue) {
+  std::ostringstream out;
+  printOutline(out, plist::Dictionary{{"b", plist::Array{true, 2.0, 2, -0.0, std::nan("")}},
+                                      {"a\n", plist::Array::create()},
+                                      {"c", plist::Dictionary{{"d", "e\x1b"}}}});
+  EXPECT_EQ(out.str(),
+            "a\\n = []\n"
+            "b:\n"
+            "  [0] = true\n"
+            "  [1] = 2.0\n"
+            "  [2] = 2\n"
+            "  [3] = -0.0\n"
+            "  [4] = nan\n"
+            "c:\n"
+            "  d = \"e\\u001b\"\n");
+}
+
+}  // namespace
+}  // namespace tavrel

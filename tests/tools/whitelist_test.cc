@@ -1,0 +1,167 @@
+// tavrelctl whitelist
+#include <gtest/gtest.h>
+
+#include "device.h"
+
+namespace tavrel {
+namespace {
+
+// Groups of a file of ours stand in the order of their names, so the later name wins.
+constexpr std::string_view kGood = R"({
+  "Apps": {
+    "ScalarKeys": {"app.starts": {"sig_fig": 2, "bucket_interval": 10}, "app.raw": {}},
+    "DistributionKeys": {"app.load": {"intervals": [10, 20.5]}}
+  },
+  "InternalTesting": {"ScalarKeys": {"app.secret": {}, "app.raw": {"sig_fig": 1}}},
+  "Radio": {
+    "ScalarKeyPrefixes": {"radio.": {"sig_fig": 1}},
+    "DistributionKeyPrefixes": {"radio.": {}}
+  }
+})";
+
+TEST(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
+  const TemporaryDevice device;
+  device.write(kWhitelistFile, xmlOf(R"({
+    "A": {
+      "Scalars": {},
+      "DistributionKeys": [],
+      "ScalarKeys": {
+        "both": {},
+        "number": 1,
+        "options": {"sigfig": 2, "intervals": [1], "sig_fig": -1, "bucket_interval": 0},
+        "types": {"sig_fig": "2", "bucket_interval": 2.5}
+      }
+    },
+    "B": {
+      "DistributionKeys": {
+        "d": {"sig_fig": 1, "intervals": 3},
+        "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5]}
+      },
+      "ScalarKeyPrefixes": {"p.": {}, "p.q.": {}, "p.q.r": {}, "p.s": {}, "": {}},
+      "ScalarKeys": {"both": {"sig_fig": 1}}
+    },
+    "C": {"ScalarKeys": {"both": {}}, "ScalarKeyPrefixes": {"p.": {}}},
+    "D": true
+  })"));
+  const std::string expected =
+      R"(A/DistributionKeys: is an array: a table is a dictionary from keys to options: ignored
+A/ScalarKeys/number: is an integer: options are a dictionary, an empty one to report the value unchanged: ignored
+A/ScalarKeys/options/bucket_interval: is 0: a bucket has a width: the value is not bucketed
+A/ScalarKeys/options/intervals: does not affect scalars: ignored
+A/ScalarKeys/options/sig_fig: is -1: expected an integer from 0 to 4294967295: used as 4294967295
+A/ScalarKeys/options/sigfig: is no option: ignored; the options are sig_fig, bucket_interval, intervals
+A/ScalarKeys/types/bucket_interval: is 2.5: expected an integer from 0 to 4294967295: used as 2
+A/ScalarKeys/types/sig_fig: is a string: expected an integer: ignored
+A/Scalars: is no table of a group: ignored; the tables are ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes
+B/DistributionKeys/d/intervals: is an integer: expected an array of numbers: no histogram is made
+B/DistributionKeys/d/sig_fig: does not affect distributions: ignored
+B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty
+B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket stays empty
+B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty
+B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty
+B/ScalarKeyPrefixes/: is the empty prefix: every key begins with it
+D: is a boolean: a group is a dictionary of tables: ignored
+A/ScalarKeys/both: is listed by group C too, which comes later and wins
+B/ScalarKeys/both: is listed by group C too, which comes later and wins
+B/ScalarKeyPrefixes/p.: is listed by group C too, which comes later and wins
+B/ScalarKeyPrefixes/: is hidden by the longer prefix B/ScalarKeyPrefixes/p. for the keys that begin so
+C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. for the keys that begin so
+B/ScalarKeyPrefixes/p.q.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q.r for the keys that begin so
+C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s for the keys that begin so
+)";
+  EXPECT_EQ(device.run({"whitelist", "check"}), (Outcome{1, expected, ""}));
+}
+
+TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
+  const TemporaryDevice device;
+  const std::string path = device.path(kWhitelistFile);
+  EXPECT_EQ(device.run({"whitelist", "check"}),
+            (Outcome{1, "", "tavrelctl: cannot read " + path + ": No such file or directory\n"}));
+  device.write(kWhitelistFile, "<plist><dict>");
+  const Outcome malformed = device.run({"whitelist", "check"});
+  EXPECT_EQ(malformed.status, 1);
+  EXPECT_TRUE(malformed.error.starts_with("tavrelctl: " + path + ": XML property list, line 1"))
+      << malformed;
+  EXPECT_EQ(device.run({"whitelist", "check", "-"}, xmlOf("[]")),
+            (Outcome{1,
+                     "standard input: is an array: a whitelist is a dictionary of groups: nothing "
+                     "is reported\n",
+                     ""}));
+  EXPECT_EQ(device.run({"whitelist", "check", "-"}, xmlOf("{}")),
+            prints("standard input: nothing to mend (digest 06e68461460e3d5f71e4211e51eb944c)\n"));
+}
+
+TEST(WhitelistCheck, ListsAThousandFindingsAndCountsTheRest) {
+  std::string json = "{\"" + std::string(1000, 'g') + "\": {\"ScalarKeys\": {";
+  for (int i = 0; i < 1234; ++i)
+    json += "\"k" + std::to_string(i) + "\": 1,";
+  json.back() = '}';
+  const TemporaryDevice device;
+  const Outcome outcome = device.run({"whitelist", "check", "-"}, xmlOf(json + "}}"));
+  EXPECT_EQ(outcome.status, 1);
+  EXPECT_EQ(std::count(outcome.out.begin(), outcome.out.end(), '\n'), 1001);
+  EXPECT_TRUE(outcome.out.ends_with("standard input: has 234 more findings\n"));
+}
+
+TEST(WhitelistExplain, NamesTheRuleAndShowsWhatItDoes) {
+  const TemporaryDevice device;
+  device.write(kWhitelistFile, xmlOf(kGood));
+  const auto explain = [&](const std::string& key, const std::string& value) {
+    return device.run({"whitelist", "explain", key, "--value", value});
+  };
+  EXPECT_EQ(explain("app.starts", "12345"), prints("app.starts\n"
+                                                   "  scalar        group Apps, exact key\n"
+                                                   "                bucket_interval 10, sig_fig 2\n"
+                                                   "                12345 is reported as 12000\n"
+                                                   "  distribution  not reported\n"));
+  EXPECT_EQ(explain("app.load", "20.5"),
+            prints("app.load\n"
+                   "  scalar        not reported\n"
+                   "  distribution  group Apps, exact key\n"
+                   "                summary and histogram, intervals [10, 20.5]\n"
+                   "                20.5 is counted in (10, 20.5]\n"));
+  EXPECT_EQ(explain("radio.x", "-15.5"),
+            prints("radio.x\n"
+                   "  scalar        group Radio, prefix radio.\n"
+                   "                sig_fig 1\n"
+                   "                the value is no 64-bit integer, as scalars are\n"
+                   "  distribution  group Radio, prefix radio.\n"
+                   "                summary only\n"));
+  EXPECT_EQ(explain("app.raw", "-9223372036854775808"),
+            prints("app.raw\n"
+                   "  scalar        group Apps, exact key\n"
+                   "                reported unchanged\n"
+                   "                -9223372036854775808 is reported as -9223372036854775808\n"
+                   "                group InternalTesting would decide, but it is for internal "
+                   "devices\n"
+                   "  distribution  not reported\n"));
+  EXPECT_EQ(explain("app.raw", "many").status, 2);
+}
+
+TEST(WhitelistExplain, FollowsTaskingAndInternalDevices) {
+  const TemporaryDevice device;
+  device.write(kWhitelistFile, xmlOf(kGood));
+  device.run({"prefs", "set", "com.norvane.da", "Radio", "false", "--bool"});
+  EXPECT_EQ(device.run({"whitelist", "explain", "radio.x"}),
+            prints("radio.x\n"
+                   "  scalar        not reported\n"
+                   "                group Radio would decide, but it is switched off by tasking\n"
+                   "  distribution  not reported\n"
+                   "                group Radio would decide, but it is switched off by "
+                   "tasking\n"));
+
+  device.write("/etc/tavrel/device-answers.plist", xmlOf(R"({"InternalBuild": true})"));
+  const Outcome outcome =
+      device.run({"whitelist", "explain", "app.raw", "other", "--value", "123", "--json"});
+  EXPECT_EQ(outcome.status, 0) << outcome;
+  const auto json = nlohmann::json::parse(outcome.out);
+  EXPECT_EQ(json["keys"][0]["scalar"], nlohmann::json::parse(R"({
+      "reported": true, "rule": "exact", "group": "InternalTesting", "options": {"sig_fig": 1},
+      "value": 123, "reported_value": 100})"));
+  EXPECT_EQ(json["keys"][1]["scalar"], nlohmann::json::parse(R"({
+      "reported": true, "rule": "internal", "options": {},
+      "value": 123, "reported_value": 123})"));
+}
+
+}  // namespace
+}  // namespace tavrel

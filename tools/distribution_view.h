@@ -1,0 +1,35 @@
+// The summaries and histograms of a tallied log, read back.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+struct DistributionView {
+  struct Bucket {
+    std::string label;
+    std::uint64_t count = 0;
+  };
+
+  std::string key;
+  double minimum = 0;
+  double maximum = 0;
+  double mean = 0;
+  double squaredDeviations = 0;  // sum of squared deviations from the mean
+  std::int64_t count = 0;
+  std::vector<Bucket> buckets;  // of the histogram, from low to high; empty without one
+
+  /// The root of the mean squared deviation; nothing when nothing was counted.
+  std::optional<double> standardDeviation() const;
+};
+
+/// The distributions of a log, ordered by key. Entries that are no summary are passed over.
+std::vector<DistributionView> distributionsOf(const plist::Dictionary& log);
+
+}  // namespace tavrel

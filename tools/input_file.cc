@@ -1,0 +1,59 @@
+#include "tools/input_file.h"
+
+#include <istream>
+#include <iterator>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/file_layer.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/plist/coding.h"
+#include "tools/json_value.h"
+
+namespace tavrel {
+namespace {
+
+Expected<std::string> readStream(std::istream& in, std::size_t largest) {
+  std::string bytes;
+  constexpr std::size_t kBlock = 64U << 10;
+  while (in) {
+    const std::size_t before = bytes.size();
+    bytes.resize(before + kBlock);
+    in.read(bytes.data() + before, kBlock);
+    bytes.resize(before + static_cast<std::size_t>(in.gcount()));
+    if (bytes.size() > largest) {
+      return Error{format("standard input: more than %zu bytes: give a smaller one", largest)};
+    }
+  }
+  if (in.bad()) return Error{"standard input: cannot be read"};
+  return bytes;
+}
+
+// Both encodings of property lists begin with other characters.
+bool looksLikeJson(std::string_view bytes) {
+  const std::size_t first = bytes.find_first_not_of(" \t\r\n");
+  return first != std::string_view::npos &&
+         std::string_view("{[\"-0123456789tfn").find(bytes[first]) != std::string_view::npos;
+}
+
+}  // namespace
+
+Expected<std::string> readInput(ToolContext& context, const std::string& file,
+                                std::size_t largest) {
+  if (file == "-") return readStream(context.in(), largest);
+  return context.linuxPlatform().fileLayer().read(file, largest);
+}
+
+Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
+  auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
+  if (!value) return Error{format("%s: %s", name, value.error().message)};
+  return value;
+}
+
+Expected<plist::Value> readDocument(ToolContext& context, const std::string& file) {
+  const auto bytes = readInput(context, file, limits::kPropertyListBytes);
+  if (!bytes) return bytes.error();
+  return decodeDocument(*bytes, file == "-" ? "standard input" : file);
+}
+
+}  // namespace tavrel

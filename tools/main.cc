@@ -1,0 +1,31 @@
+#include <iostream>
+#include <optional>
+#include <string>
+#include <sys/ioctl.h>
+#include <unistd.h>
+#include <vector>
+
+#include "tools/tavrelctl.h"
+
+namespace {
+
+// Nothing when standard output is no terminal; a terminal that does not know its width counts as
+// 80 columns.
+std::optional<std::size_t> terminalColumns() {
+  if (!isatty(STDOUT_FILENO)) return std::nullopt;
+  winsize size{};
+  if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return 80;
+  return size.ws_col;
+}
+
+}  // namespace
+
+int main(int argc, char** argv) {
+  std::ios::sync_with_stdio(false);
+  return tavrel::runTavrelctl(std::vector<std::string>(argv + 1, argv + argc),
+                              {.in = std::cin,
+                               .out = std::cout,
+                               .error = std::cerr,
+                               .columns = terminalColumns(),
+                               .errorIsTerminal = isatty(STDERR_FILENO) == 1});
+}

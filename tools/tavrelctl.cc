@@ -1,0 +1,78 @@
+#include "tools/tavrelctl.h"
+
+#include <CLI/CLI.hpp>
+#include <exception>
+#include <ostream>
+
+#include "base/format.h"
+#include "tools/log_commands.h"
+#include "tools/plist_commands.h"
+#include "tools/prefs_commands.h"
+#include "tools/send_commands.h"
+#include "tools/stat_commands.h"
+#include "tools/status_command.h"
+#include "tools/tasking_commands.h"
+#include "tools/whitelist_commands.h"
+
+namespace tavrel {
+namespace {
+
+// The subcommand that was being parsed, as it is typed.
+std::string commandLineOf(const CLI::App& app) {
+  std::string line = app.get_name();
+  for (const CLI::App* command = &app; !command->get_subcommands().empty();) {
+    command = command->get_subcommands().front();
+    line += ' ' + command->get_name();
+  }
+  return line;
+}
+
+void addGlobalOptions(CLI::App& app, ToolContext& context) {
+  app.fallthrough();
+  app.require_subcommand(1);
+  app.footer("--root DIR may stand anywhere on the line. See tavrelctl(1).");
+  app.set_version_flag("--version", "tavrelctl " TAVREL_VERSION);
+  app.add_option_function<std::string>(
+         "--root", [&context](const std::string& folder) { context.setRoot(folder); },
+         "Folder that holds the device's files (default: TAVREL_ROOT, else /)")
+      ->type_name("DIR");
+}
+
+void run(const std::vector<std::string>& arguments, ToolContext& context) {
+  CLI::App app("Looks into tavrel and the statistics that it reports.", "tavrelctl");
+  addGlobalOptions(app, context);
+  addStatusCommand(app, context);
+  addLogCommands(app, context);
+  addWhitelistCommands(app, context);
+  addStatCommands(app, context);
+  addSendCommands(app, context);
+  addTaskingCommands(app, context);
+  addPrefsCommands(app, context);
+  addPlistCommands(app, context);
+
+  try {
+    app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
+  } catch (const CLI::ParseError& error) {
+    if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+      app.exit(error, context.out(), context.error());
+    } else {
+      context.failUsage(format("%s: see '%s --help'", error.what(), commandLineOf(app)));
+    }
+  }
+}
+
+}  // namespace
+
+int runTavrelctl(const std::vector<std::string>& arguments, const ToolStreams& streams) {
+  ToolContext context(streams);
+  try {
+    run(arguments, context);
+  } catch (const std::exception& error) {
+    context.fail(error.what());
+  }
+  streams.out.flush();
+  if (!streams.out) context.fail("cannot write standard output: free space or mend the pipe");
+  return context.exitStatus();
+}
+
+}  // namespace tavrel

@@ -1,0 +1,15 @@
+// The command line tavrelctl, apart from the process around it.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "tools/tool_context.h"
+
+namespace tavrel {
+
+/// Runs one command line, without the program's name, and yields the exit status: 0 for success, 1
+/// for failure, 2 for wrong usage. Nothing is thrown.
+int runTavrelctl(const std::vector<std::string>& arguments, const ToolStreams& streams);
+
+}  // namespace tavrel

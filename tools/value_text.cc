@@ -1,0 +1,98 @@
+#include "tools/value_text.h"
+
+#include <algorithm>
+#include <cmath>
+#include <ostream>
+#include <vector>
+
+#include "base/text.h"
+#include "tools/table.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Kind;
+
+bool isFilledContainer(const plist::Value& value) {
+  return !value.array().empty() || !value.dictionary().empty();
+}
+
+void printMember(std::ostream& out, std::string_view name, const plist::Value& value,
+                 std::size_t indent) {
+  out << std::string(indent, ' ') << name;
+  if (isFilledContainer(value)) {
+    out << ":\n";
+    printOutline(out, value, indent + 2);
+  } else {
+    out << " = " << printable(inlineText(value)) << '\n';
+  }
+}
+
+}  // namespace
+
+std::string_view kindName(const plist::Value& value) {
+  switch (value.kind()) {
+    case Kind::Boolean:
+      return "boolean";
+    case Kind::Number:
+      return value.number()->isFloating() ? "real" : "integer";
+    case Kind::Date:
+      return "date";
+    case Kind::String:
+      return "string";
+    case Kind::Data:
+      return "data";
+    case Kind::Array:
+      return "array";
+    case Kind::Dictionary:
+      return "dictionary";
+    case Kind::Null:
+      break;
+  }
+  return "null";
+}
+
+std::string kindWithArticle(const plist::Value& value) {
+  const std::string_view name = kindName(value);
+  const bool vowel = name.starts_with('i') || name.starts_with('a');
+  return (vowel ? "an " : "a ") + std::string(name);
+}
+
+std::string inlineText(const plist::Value& value) {
+  if (const auto boolean = value.boolean()) return *boolean ? "true" : "false";
+  if (const auto text = value.string()) {
+    std::string quoted;
+    appendQuoted(quoted, *text);
+    return quoted;
+  }
+  std::string text = textOf(value);
+  if (const auto number = value.number(); number && number->isFloating()) {
+    const bool looksLikeInteger = text.find_first_not_of("-0123456789") == std::string::npos;
+    if (looksLikeInteger) text += ".0";
+  }
+  return text;
+}
+
+void printOutline(std::ostream& out, const plist::Value& value, std::size_t indent) {
+  if (!isFilledContainer(value)) {
+    out << std::string(indent, ' ') << printable(inlineText(value)) << '\n';
+    return;
+  }
+  if (const auto array = value.array()) {
+    std::size_t index = 0;
+    for (const plist::Value& element : array) {
+      printMember(out, '[' + std::to_string(index++) + ']', element, indent);
+    }
+    return;
+  }
+  std::vector<std::pair<std::string_view, const plist::Value*>> members;
+  const auto dictionary = value.dictionary();
+  for (const plist::Entry& entry : dictionary)
+    members.emplace_back(entry.key, &entry.value);
+  std::sort(members.begin(), members.end(),
+            [](const auto& a, const auto& b) { return a.first < b.first; });
+  for (const auto& [key, member] : members)
+    printMember(out, printable(key), *member, indent);
+}
+
+}  // namespace tavrel

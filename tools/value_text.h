@@ -1,0 +1,27 @@
+// Property-list values for people.
+#pragma once
+
+#include <cstddef>
+#include <iosfwd>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// "boolean", "integer", "real", "date", "string", "data", "array" or "dictionary".
+std::string_view kindName(const plist::Value& value);
+
+/// The same with its article, for messages: "an integer".
+std::string kindWithArticle(const plist::Value& value);
+
+/// A value on one line whose kind can be seen: true, 12, 2.0, "text", 2026-11-16 18:02:18 +0000,
+/// <0102>; containers as base/text.h writes them.
+std::string inlineText(const plist::Value& value);
+
+/// A value over several lines, the content of containers indented by two blanks per level. Keys
+/// are sorted.
+void printOutline(std::ostream& out, const plist::Value& value, std::size_t indent = 0);
+
+}  // namespace tavrel

@@ -1,0 +1,22 @@
+// What in a whitelist would not do what its author may think.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// What is wrong at one place of the whitelist.
+struct WhitelistFinding {
+  std::string path;  // "Group/ScalarKeys/key/sig_fig"; empty for the whole file
+  std::string message;
+};
+
+/// Everything that the daemon would ignore or that has a wrong type, then keys in more than one
+/// group and prefixes that hide others. At most `limits::kWhitelistFindings`, and one that counts
+/// the rest.
+std::vector<WhitelistFinding> checkWhitelist(const plist::Value& whitelist);
+
+}  // namespace tavrel

@@ -1,0 +1,98 @@
+// The whitelist as its author wrote it: every rule with the group and table that it stands in.
+//
+// The daemon keeps only the union of the groups; this model keeps where each rule came from, so
+// that the tool can say which one decides and which are without effect.
+//
+//   const WhitelistModel model(*decoded);
+//   const WhitelistDecisions decisions(model, isInternal, isLoaded);
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "base/plist.h"
+#include "config/bh_config.h"
+
+namespace tavrel {
+
+/// Where a rule stands, in the order of `kWhitelistTables`.
+enum class WhitelistTable : std::uint8_t {
+  ScalarKeys,
+  ScalarPrefixes,
+  DistributionKeys,
+  DistributionPrefixes,
+};
+
+inline constexpr std::array kWhitelistTables = {kScalarKeysTable, kScalarPrefixesTable,
+                                                kDistributionKeysTable, kDistributionPrefixesTable};
+
+constexpr bool isPrefixTable(WhitelistTable table) {
+  return table == WhitelistTable::ScalarPrefixes || table == WhitelistTable::DistributionPrefixes;
+}
+constexpr bool isDistributionTable(WhitelistTable table) {
+  return table == WhitelistTable::DistributionKeys || table == WhitelistTable::DistributionPrefixes;
+}
+
+struct WhitelistRule {
+  std::string_view group;
+  std::string_view key;  // or prefix
+  plist::Dictionary options;
+};
+
+class WhitelistModel {
+ public:
+  /// Rules that would not be loaded for their type are left out.
+  explicit WhitelistModel(plist::Value whitelist);
+
+  /// The rules of a table in the order in which the daemon loads them.
+  const std::vector<WhitelistRule>& rules(WhitelistTable table) const {
+    return rules_[static_cast<std::size_t>(table)];
+  }
+
+ private:
+  plist::Value whitelist_;  // keeps what the rules borrow
+  std::array<std::vector<WhitelistRule>, kWhitelistTables.size()> rules_;
+};
+
+/// How the whitelist decides on one key.
+struct WhitelistDecision {
+  enum class Rule : std::uint8_t { None, Exact, Prefix, Internal };
+  Rule rule = Rule::None;
+  std::string_view group;  // of the rule; empty for `None` and `Internal`
+  std::string_view prefix;
+};
+
+/// Finds the deciding rule of keys, in time that does not depend on the number of rules. The model
+/// must outlive it.
+class WhitelistDecisions {
+ public:
+  /// `isLoaded` tells whether the daemon loads a group of this name.
+  template <class IsLoaded>
+  WhitelistDecisions(const WhitelistModel& model, bool isInternalDevice, IsLoaded isLoaded)
+      : isInternalDevice_(isInternalDevice) {
+    for (std::size_t table = 0; table < kWhitelistTables.size(); ++table) {
+      for (const WhitelistRule& rule : model.rules(static_cast<WhitelistTable>(table))) {
+        if (isLoaded(rule.group)) groups_[table][rule.key] = rule.group;
+      }
+    }
+    buildTrees();
+  }
+
+  WhitelistDecision decide(WhitelistTable keys, WhitelistTable prefixes,
+                           std::string_view key) const;
+
+ private:
+  void buildTrees();
+
+  bool isInternalDevice_;
+  std::array<std::unordered_map<std::string_view, std::string_view>, kWhitelistTables.size()>
+      groups_;  // by key or prefix: the group that decides
+  std::array<PrefixTree, kWhitelistTables.size()> trees_;  // of the prefix tables
+};
+
+}  // namespace tavrel
