@@ -23,10 +23,7 @@ std::string keyNumber(std::int64_t number) {
 
 class Device {
  public:
-  Device() {
-    std::string name = (std::filesystem::temp_directory_path() / "tavrel-bench-XXXXXX").string();
-    folder_ = mkdtemp(name.data());
-  }
+  Device() : folder_(makeFolder()), linux_(DeviceRoot(folder_)) {}
   ~Device() { std::filesystem::remove_all(folder_); }
   Device(const Device&) = delete;
   Device& operator=(const Device&) = delete;
@@ -60,8 +57,14 @@ class Device {
   }
 
  private:
+  static std::string makeFolder() {
+    std::string name = (std::filesystem::temp_directory_path() / "tavrel-bench-XXXXXX").string();
+    if (!mkdtemp(name.data())) abort();
+    return name;
+  }
+
   std::string folder_;
-  LinuxPlatform linux_{DeviceRoot(folder_)};
+  LinuxPlatform linux_;
 };
 
 void scalarsOfDay(benchmark::State& state) {

@@ -19,16 +19,16 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
   if (prefixes_.empty()) return;
   nodes_.emplace_back();
   branch_.push_back(0);
-  build(0, 0, prefixes_.size());
+  build();
 }
 
 // Ranges still to be built are kept on a list of their own: how deep prefixes nest is the file's
 // choice and must not decide how deep the machine's stack goes.
-void PrefixTree::build(std::size_t node, std::size_t begin, std::size_t end) {
+void PrefixTree::build() {
   struct Range {
     std::size_t node, begin, end;
   };
-  std::vector<Range> pending{{node, begin, end}};
+  std::vector<Range> pending{{0, 0, prefixes_.size()}};
   while (!pending.empty()) {
     const Range range = pending.back();
     pending.pop_back();

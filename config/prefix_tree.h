@@ -32,7 +32,7 @@ class PrefixTree {
     bool isPrefix;  // the node's text is itself a prefix
   };
 
-  void build(std::size_t node, std::size_t begin, std::size_t end);
+  void build();
   const Node* childFor(const Node& node, unsigned char next) const;
 
   std::vector<std::string> prefixes_;  // sorted, each once

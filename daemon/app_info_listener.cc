@@ -1,5 +1,8 @@
 #include "daemon/app_info_listener.h"
 
+#include <cstdint>
+#include <optional>
+
 #include "daemon/app_info.h"
 #include "daemon/daily_run.h"
 
@@ -24,29 +27,33 @@ void announce(Platform& platform) {
   platform.log.log(LogLevel::Default, "notified of logging status, waiting for activate app info");
 }
 
-void forceDay(Platform& platform, const plist::Dictionary& message) {
-  const auto day = message.number("value");
-  dailyTasksForDay(platform, day ? day->int32() : 0, plist::Array());
+/// The low half of an integer entry.
+std::optional<std::int32_t> integerIn(const plist::Dictionary& message, std::string_view entry) {
+  const auto number = message.number(entry);
+  if (!number || number->isFloating()) return std::nullopt;
+  return number->int32();
 }
 
 }  // namespace
 
 void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
   const plist::Dictionary message = event.dictionary();
-  const auto operation = message.number("operation");
+  const auto operation = integerIn(message, "operation");
   if (!operation) return;
-  if (operation->int32() == kDeliver) {
-    deliver(platform, message.array("app_data"));
+  if (*operation == kDeliver) {
+    if (const auto appData = message.array("app_data")) deliver(platform, appData);
     return;
   }
+  const auto day = integerIn(message, "value");
+  if (*operation == kForceDay && !day) return;
   if (platform.state.clientRequestHandled) return;
   platform.state.clientRequestHandled = true;
-  switch (operation->int32()) {
+  switch (*operation) {
     case kAnnounce:
       announce(platform);
       break;
     case kForceDay:
-      forceDay(platform, message);
+      dailyTasksForDay(platform, *day, plist::Array());
       break;
     default:
       break;

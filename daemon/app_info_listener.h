@@ -2,17 +2,19 @@
 // applications.
 //
 // A message is a dictionary with a number "operation": 0 announces app information, 1 forces the
-// tasks of the day "value", 2 delivers the information in "app_data". Nothing is ever answered.
+// tasks of the day "value", 2 delivers the information in "app_data". A message that lacks what its
+// operation needs is ignored. Nothing is ever answered.
 #pragma once
 
 #include <memory>
 #include <string_view>
 
+#include "config/persisted_state.h"
 #include "platform/platform.h"
 
 namespace tavrel {
 
-inline constexpr std::string_view kAppInfoServiceName = "com.norvane.tallied.tavrel";
+inline constexpr std::string_view kAppInfoServiceName = kTavrelDomain;
 inline constexpr std::string_view kLoggingNotification = "com.norvane.tallied.tavrel.logging";
 
 /// Starts to listen; events are handled while the event loop runs. The service ends when the

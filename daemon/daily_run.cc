@@ -1,15 +1,11 @@
 #include "daemon/daily_run.h"
 
 #include "base/arithmetic.h"
+#include "config/persisted_state.h"
 #include "daemon/tasking.h"
 #include "report/bh_report.h"
 
 namespace tavrel {
-namespace {
-
-constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
-
-}  // namespace
 
 void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo) {
   const std::int32_t yesterday = previousDay(platform.statistics.BHDaysSince1970());

@@ -4,46 +4,36 @@
 #include <set>
 #include <string>
 
-#include "report/bh_report.h"
+#include "config/persisted_state.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kScheduleDomain = "com.norvane.Drovelink";
-constexpr std::string_view kScheduledTaskingKey = "ScheduledTasking";
-constexpr std::string_view kLastOSUpdateKey = "LastOSUpdate";
-constexpr std::string_view kTaskingIDKey = "TaskingID";
-constexpr std::string_view kTaskingOSKey = "TaskingOS";
-constexpr std::string_view kTaskingDigestKey = "TaskingDigest";
-constexpr std::string_view kTaskingPayloadKey = "TaskingPayload";
 constexpr std::string_view kTaskingChanged = "com.norvane.da.tasking_changed";
 constexpr std::string_view kAggressiveDaysValue = "AggressiveSubmissionDays";
 
-/// Changes to preferences in many domains, each of which is synchronised once.
-class PreferenceChanges {
+/// Writes preferences and remembers the domains, each of which is synchronised once.
+class PreferenceWriter {
  public:
-  explicit PreferenceChanges(Preferences& preferences) : preferences_(preferences) {}
+  explicit PreferenceWriter(Preferences& preferences) : preferences_(preferences) {}
 
+  /// A null value removes the key.
   void set(std::string_view domain, std::string_view key, const plist::Value& value) {
     preferences_.ZTXPreferencesSetValue(key, value, domain);
-    if (domain != kTavrelDomain) {
-      domains_.emplace(domain);
-    } else {
-      touchedOwnDomain_ = true;
-    }
+    domains_.emplace(domain);
   }
   void remove(std::string_view domain, std::string_view key) { set(domain, key, {}); }
 
   void synchronize() {
+    const bool touchedOwnDomain = domains_.erase(std::string(kTavrelDomain)) != 0;
     for (const std::string& domain : domains_)
       preferences_.ZTXPreferencesSynchronize(domain);
-    if (touchedOwnDomain_) preferences_.ZTXPreferencesSynchronize(kTavrelDomain);
+    if (touchedOwnDomain) preferences_.ZTXPreferencesSynchronize(kTavrelDomain);
   }
 
  private:
   Preferences& preferences_;
-  std::set<std::string, std::less<>> domains_;
-  bool touchedOwnDomain_ = false;
+  std::set<std::string> domains_;
 };
 
 /// Calls `visit` with the domain and key of each setting that has both.
@@ -86,15 +76,15 @@ class Tracker {
     const plist::Value appliedOS = own(kTaskingOSKey);
     if (appliedID == newID && appliedOS == build_) return true;
 
-    PreferenceChanges changes(platform_.preferences);
+    PreferenceWriter writer(platform_.preferences);
     if (appliedID) {
       platform_.log.log(LogLevel::Default,
                         "Tasking update (%{public}@ -> %{public}@, %{public}@ -> %{public}@)",
                         appliedID, newID, appliedOS, build_);
-      undo(changes);
+      undo(writer);
     }
-    apply(scheduled, changes);
-    changes.synchronize();
+    apply(scheduled, writer);
+    writer.synchronize();
     platform_.notifications.post(kTaskingChanged);
     return true;
   }
@@ -117,26 +107,26 @@ class Tracker {
     return platform_.preferences.ZTXPreferencesGetValue(key, kTavrelDomain);
   }
 
-  void undo(PreferenceChanges& changes) {
+  void undo(PreferenceWriter& writer) {
     forEachSetting(own(kTaskingPayloadKey).array(),
                    [&](const plist::Dictionary&, std::string_view domain, std::string_view key) {
-                     changes.remove(domain, key);
+                     writer.remove(domain, key);
                    });
     for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey}) {
-      changes.remove(kTavrelDomain, key);
+      writer.remove(kTavrelDomain, key);
     }
   }
 
-  void apply(const plist::Dictionary& scheduled, PreferenceChanges& changes) {
+  void apply(const plist::Dictionary& scheduled, PreferenceWriter& writer) {
     const plist::Array payload = scheduled.array(kTaskingPayloadKey);
     if (!payload) return;
     forEachSetting(payload,
                    [&](const plist::Dictionary& setting, std::string_view domain,
-                       std::string_view key) { changes.set(domain, key, setting.get("Value")); });
-    changes.set(kTavrelDomain, kTaskingIDKey, scheduled.get(kTaskingIDKey));
-    changes.set(kTavrelDomain, kTaskingOSKey, build_);
-    changes.set(kTavrelDomain, kTaskingDigestKey, scheduled.get(kTaskingDigestKey));
-    changes.set(kTavrelDomain, kTaskingPayloadKey, payload);
+                       std::string_view key) { writer.set(domain, key, setting.get("Value")); });
+    writer.set(kTavrelDomain, kTaskingIDKey, scheduled.get(kTaskingIDKey));
+    writer.set(kTavrelDomain, kTaskingOSKey, build_);
+    writer.set(kTavrelDomain, kTaskingDigestKey, scheduled.get(kTaskingDigestKey));
+    writer.set(kTavrelDomain, kTaskingPayloadKey, payload);
   }
 
   Platform& platform_;

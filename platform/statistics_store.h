@@ -39,13 +39,19 @@ class BHHistoryDistributionEnumerator {
     return true;
   }
 
+  /// True when values are missing because they could not be read; the reason has been reported.
+  bool failed() const { return failed_; }
+
  protected:
   /// The next values, which stay valid until the next call; empty when none is left.
   virtual std::span<const Sample> nextBlock() = 0;
+  /// To be called before `nextBlock` yields nothing for a failure.
+  void fail() { failed_ = true; }
 
  private:
   const Sample* next_ = nullptr;
   const Sample* end_ = nullptr;
+  bool failed_ = false;
 };
 
 /// A reader of the store. Queries select the rows whose key begins with the prefix and whose day

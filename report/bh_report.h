@@ -22,9 +22,6 @@ namespace tavrel {
 inline constexpr std::string_view kTalliedLogType = "193";
 inline constexpr std::string_view kTalliedLogName = "log-tallied";
 
-/// The domain of the daemon's own state, and the name of its service.
-inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
-
 class BHReport {
  public:
   /// Loads the whitelist; without one nothing is collected. The platform must outlive the report.
@@ -50,6 +47,7 @@ class BHReport {
   // Distributions.
 
   /// Stores the summary of the values, and their histogram when the options have "intervals".
+  /// Values that cannot all be read give no entry.
   void computeAndAddDistribution(BHHistoryDistributionEnumerator& values, std::string_view forKey,
                                  const plist::Dictionary& withOptions);
 

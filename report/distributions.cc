@@ -61,6 +61,9 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
     if (histogram) histogram->count(value);
   }
 
+  // A summary of some of the values would pass for one of all of them.
+  if (values.failed()) return;
+
   if (histogram) {
     _histogramsOutput.set(forKey, histogramDictForIntervals(intervals, histogram->counts()));
   }

@@ -1,12 +1,12 @@
 #include <string>
 
 #include "base/utf8.h"
+#include "config/persisted_state.h"
 #include "report/bh_report.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kLastOSVersionKey = "LastOSVersion";
 constexpr std::string_view kInternalDiagnosticsIdentifier = "com.norvane.zentrix.tallied.tavrel";
 
 constexpr std::int32_t kLogVersion = 1;
@@ -54,9 +54,9 @@ void BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInf
 plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& appInfo,
                                           const std::string& whitelistDigest) {
   Preferences& preferences = platform_.preferences;
-  const auto taskingID = preferences.ZTXPreferencesGetValue("TaskingID", kTavrelDomain);
-  const auto taskingDigest = preferences.ZTXPreferencesGetValue("TaskingDigest", kTavrelDomain);
-  const auto taskingPayload = preferences.ZTXPreferencesGetValue("TaskingPayload", kTavrelDomain);
+  const auto taskingID = preferences.ZTXPreferencesGetValue(kTaskingIDKey, kTavrelDomain);
+  const auto taskingDigest = preferences.ZTXPreferencesGetValue(kTaskingDigestKey, kTavrelDomain);
+  const auto taskingPayload = preferences.ZTXPreferencesGetValue(kTaskingPayloadKey, kTavrelDomain);
 
   plist::Dictionary log{
       {"BHCrashLogVersion", kLogVersion},

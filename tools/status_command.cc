@@ -5,18 +5,16 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "config/persisted_state.h"
 #include "platform/linux/file_layer.h"
 #include "platform/linux/file_submission.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/sqlite_store.h"
-#include "report/bh_report.h"
 #include "tools/day_argument.h"
 #include "tools/table.h"
 
 namespace tavrel {
 namespace {
-
-constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
 struct DeviceStatus {
   bool submissionAllowed = false;
@@ -47,7 +45,7 @@ DeviceStatus takeStatus(ToolContext& context) {
       platform.preferences.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
   if (hasRun) status.lastDay = lowInt32(lastDay);
   if (const auto version =
-          platform.preferences.ZTXPreferencesGetValue("LastOSVersion", kTavrelDomain).string()) {
+          platform.preferences.ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
     status.osVersion = *version;
   }
   status.storePath = device.store().path();

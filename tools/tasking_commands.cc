@@ -9,6 +9,7 @@
 #include <utility>
 #include <vector>
 
+#include "config/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/input_file.h"
 #include "tools/json_value.h"
@@ -18,10 +19,6 @@
 
 namespace tavrel {
 namespace {
-
-constexpr std::string_view kScheduledDomain = "com.norvane.Drovelink";
-constexpr std::string_view kScheduledKey = "ScheduledTasking";
-constexpr std::string_view kAppliedDomain = "com.norvane.tallied.tavrel";
 
 /// More findings than this say nothing new about a document.
 constexpr std::size_t kFindingsShown = 20;
@@ -36,17 +33,17 @@ struct Tasking {
 
 struct Taskings {
   explicit Taskings(Platform& platform)
-      : document(platform.preferences.ZTXPreferencesGetValue(kScheduledKey, kScheduledDomain)) {
+      : document(platform.preferences.ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)) {
     const plist::Dictionary dictionary = document.dictionary();
-    scheduled = {dictionary.get("TaskingID"),
+    scheduled = {dictionary.get(kTaskingIDKey),
                  {},
-                 dictionary.get("TaskingDigest"),
-                 dictionary.get("TaskingPayload")};
+                 dictionary.get(kTaskingDigestKey),
+                 dictionary.get(kTaskingPayloadKey)};
     const auto get = [&](std::string_view key) {
-      return platform.preferences.ZTXPreferencesGetValue(key, kAppliedDomain);
+      return platform.preferences.ZTXPreferencesGetValue(key, kTavrelDomain);
     };
-    applied = {get("TaskingID"), get("TaskingOS"), get("TaskingDigest"), get("TaskingPayload")};
-    lastUpdate = get("LastOSUpdate").dictionary();
+    applied = {get(kTaskingIDKey), get(kTaskingOSKey), get(kTaskingDigestKey), get(kTaskingPayloadKey)};
+    lastUpdate = get(kLastOSUpdateKey).dictionary();
     build = platform.systemVersion.systemVersionDictionary().get(kProductBuildVersionKey);
   }
 
@@ -126,9 +123,9 @@ void show(ToolContext& context) {
 
 bool store(ToolContext& context, const plist::Value& tasking) {
   Preferences& preferences = context.platform().preferences;
-  preferences.ZTXPreferencesSetValue(kScheduledKey, tasking, kScheduledDomain);
-  if (preferences.ZTXPreferencesSynchronize(kScheduledDomain)) return true;
-  context.fail("cannot write preference domain " + std::string(kScheduledDomain) +
+  preferences.ZTXPreferencesSetValue(kScheduledTaskingKey, tasking, kScheduleDomain);
+  if (preferences.ZTXPreferencesSynchronize(kScheduleDomain)) return true;
+  context.fail("cannot write preference domain " + std::string(kScheduleDomain) +
                ": see the line before; run as root, or name another device with --root");
   return false;
 }
@@ -149,7 +146,7 @@ void schedule(ToolContext& context, const std::string& path) {
   if (!findings.empty() || !store(context, *tasking)) return;
 
   const plist::Dictionary dictionary = tasking->dictionary();
-  context.out() << "Scheduled tasking " << printable(text(dictionary.get("TaskingID"))) << " with "
+  context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey))) << " with "
                 << dictionary.array("TaskingPayload").size() << " settings. The next daily run "
                 << Taskings(context.platform()).nextRun() << ".\n";
 }

@@ -5,7 +5,9 @@
 
 #include "base/civil_time.h"
 #include "base/limits.h"
+#include "base/uuid.h"
 #include "platform/linux/digests.h"
+#include "platform/linux/guarded_end.h"
 #include "platform/linux/json_line.h"
 #include "platform/linux/random.h"
 #include "platform/linux/stamp.h"
@@ -39,7 +41,7 @@ bool isFilled(const std::string& path) {
 }  // namespace
 
 FileCrashReporting::~FileCrashReporting() {
-  flushRecords();
+  endGuarded(log_, "flush structured records", [this] { flushRecords(); });
 }
 
 void FileCrashReporting::FLLogStructuredData(std::uint32_t logType,

@@ -1,5 +1,6 @@
 #include "platform/linux/file_device_answers.h"
 
+#include <cerrno>
 #include <sys/statvfs.h>
 
 #include "base/arithmetic.h"

@@ -1,12 +1,9 @@
 #include "platform/linux/file_notifications.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <charconv>
-#include <cstdio>
-#include <fcntl.h>
+#include <chrono>
 #include <poll.h>
-#include <sys/file.h>
 #include <sys/inotify.h>
 #include <unistd.h>
 
@@ -23,14 +20,10 @@ namespace {
 /// Longer than any 64-bit number with its line end.
 constexpr std::size_t kLongestCounter = 32;
 
-Status writeNew(const std::string& path, std::string_view text) {
-  const Descriptor file(
-      open(path.c_str(), O_WRONLY | O_CREAT | O_TRUNC | O_CLOEXEC | O_NOFOLLOW, 0644));
-  if (!file) return systemError("open", path);
-  const ssize_t written = write(file.get(), text.data(), text.size());
-  if (written < 0) return systemError("write", path);
-  if (static_cast<std::size_t>(written) != text.size()) return systemError("write", path, ENOSPC);
-  return Done{};
+std::uint64_t microsecondsSince1970() {
+  using std::chrono::microseconds;
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  return static_cast<std::uint64_t>(std::chrono::duration_cast<microseconds>(now).count());
 }
 
 }  // namespace
@@ -53,26 +46,21 @@ Expected<std::uint64_t> FileNotifications::tryPost(std::string_view name) {
   const auto path = pathOf(name);
   if (!path) return path.error();
   FileLayer files;
-  if (const auto made = files.makeFolders(folder_); !made) return made.error();
-
   // Not the counter itself: whoever may read that could lock it and hold up everybody.
-  const std::string lockPath = folder_ + "/.lock";
-  const Descriptor lock(
-      open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600));
-  if (!lock) return systemError("open", lockPath);
-  while (flock(lock.get(), LOCK_EX) != 0) {
-    if (errno != EINTR) return systemError("lock", lockPath);
-  }
+  const auto lock = files.lockFile(folder_ + "/.lock");
+  if (!lock) return lock.error();
 
   const auto before = count(name);
-  if (!before) return before.error();
-  // Not flushed: what is in /run does not outlive the machine's run.
-  const std::string fresh = folder_ + "/.new";
-  if (const auto written = writeNew(fresh, format("%llu\n", *before + 1)); !written) {
+  // More than any counter has reached, so that everyone who waits takes it for news.
+  const std::uint64_t now = before ? *before + 1 : microsecondsSince1970();
+  const std::string text = format("%llu\n", now);
+  if (const auto written = files.replace(*path, asBytes(text), 0644); !written) {
     return written.error();
   }
-  if (std::rename(fresh.c_str(), path->c_str()) != 0) return systemError("replace", *path);
-  return *before + 1;
+  if (!before) {
+    log_.log(LogLevel::Error, "%s; counting begins anew at %llu", before.error().message, now);
+  }
+  return now;
 }
 
 Expected<std::uint64_t> FileNotifications::count(std::string_view name) const {
@@ -87,7 +75,7 @@ Expected<std::uint64_t> FileNotifications::count(std::string_view name) const {
   const char* end = digits.data() + digits.size();
   const auto [stop, error] = std::from_chars(digits.data(), end, number);
   if (error != std::errc() || std::string_view(stop, end) != "\n") {
-    return Error{format("%s holds no number and a line end; remove the file", *path)};
+    return Error{format("%s holds no number and a line end", *path)};
   }
   return number;
 }

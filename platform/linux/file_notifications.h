@@ -6,7 +6,9 @@
 //
 //   inotifywait -e moved_to /run/tavrel/notifications
 //
-// Posters take turns by locking ".lock" in the folder.
+// Posters take turns by locking ".lock" in the folder. A counter that cannot be read is replaced by
+// the next post, with a line, and goes on from the microseconds since 1970: a number that nobody
+// who waits has seen.
 #pragma once
 
 #include <chrono>

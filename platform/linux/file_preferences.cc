@@ -1,9 +1,11 @@
 #include "platform/linux/file_preferences.h"
 
 #include <algorithm>
+#include <utility>
 
 #include "base/limits.h"
 #include "base/text.h"
+#include "platform/linux/guarded_end.h"
 #include "platform/linux/random.h"
 #include "platform/linux/stamp.h"
 
@@ -13,6 +15,9 @@ namespace {
 constexpr std::string_view kFolder = "/var/mobile/Library/Preferences";
 constexpr std::string_view kEnding = ".plist";
 constexpr mode_t kMode = 0644;
+
+/// Bytes of one change as XML: no sender may fill a domain that others share with a single value.
+constexpr std::size_t kLargestChange = limits::kPreferenceFileBytes / 8;
 
 std::string quoted(std::string_view text) {
   std::string out;
@@ -31,8 +36,9 @@ FilePreferences::FilePreferences(const DeviceRoot& root, FileLayer& files,
       log_(log) {}
 
 FilePreferences::~FilePreferences() {
-  for (auto& [name, domain] : domains_)
-    synchronize(domain, name);
+  for (auto& entry : domains_) {
+    endGuarded(log_, "write the last preferences", [&] { synchronize(entry.second, entry.first); });
+  }
 }
 
 bool FilePreferences::isValidDomain(std::string_view domain) {
@@ -165,11 +171,7 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   for (const auto& [key, value] : domain.changes)
     merged.set(key, value);
   if (!merged) merged = plist::Dictionary::create();
-  auto bytes = propertyLists_.encodeXml(merged);
-  if (!bytes) {
-    dropChangesWithoutText(domain, merged, name);
-    bytes = propertyLists_.encodeXml(merged);
-  }
+  auto bytes = encodeWhatFits(domain, content->values, merged, name);
   if (!bytes) return Error{"cannot write preferences " + path + ": " + bytes.error().message};
   if (bytes->size() > limits::kPreferenceFileBytes) {
     return Error{"cannot write preferences " + path + ": they need " +
@@ -184,18 +186,55 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   return Done{};
 }
 
-// A value that no property list can hold, such as a date that is no number, must not keep the rest
-// of its domain from being written.
-void FilePreferences::dropChangesWithoutText(Domain& domain, plist::Dictionary& merged,
-                                             std::string_view name) {
+// A change that the file cannot take, such as a date that is no number or a text beyond all bounds,
+// must not keep the rest of its domain from being written.
+Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
+                                                      const plist::Dictionary& stored,
+                                                      plist::Dictionary& merged,
+                                                      std::string_view name) {
+  auto bytes = propertyLists_.encodeXml(merged);
+  if (bytes && bytes->size() <= kLargestChange) return bytes;
+
+  const auto drop = [&](const std::string& key, const std::string& why) {
+    log_.log(LogLevel::Error, "cannot write preference %s of domain %s: %s; it is dropped",
+             quoted(key.substr(0, limits::kPreferenceDomainBytes)), name, why);
+    merged.set(key, stored.get(key));
+    domain.changes.erase(key);
+  };
+  std::vector<std::pair<std::size_t, std::string>> changes;  // each with the bytes that it needs
+  std::map<std::string, std::string> unfit;                  // each with the reason
   for (const auto& [key, value] : domain.changes) {
     if (value.isNull()) continue;
-    const auto bytes = propertyLists_.encodeXml(plist::Dictionary{{key, value}});
-    if (bytes) continue;
-    log_.log(LogLevel::Error, "cannot write preference %s of domain %s: %s; it is dropped",
-             quoted(key), name, bytes.error().message);
-    merged.remove(key);
+    const auto alone = propertyLists_.encodeXml(plist::Dictionary{{key, value}});
+    if (!alone) {
+      unfit[key] = alone.error().message;
+    } else if (alone->size() > kLargestChange) {
+      unfit[key] = format("it needs %llu bytes and may have %llu", std::uint64_t{alone->size()},
+                          std::uint64_t{kLargestChange});
+    } else {
+      changes.emplace_back(alone->size(), key);
+    }
   }
+  for (const auto& [key, why] : unfit)
+    drop(key, why);
+  if (!unfit.empty()) bytes = propertyLists_.encodeXml(merged);
+
+  std::sort(changes.begin(), changes.end());
+  while (bytes && bytes->size() > limits::kPreferenceFileBytes && !changes.empty()) {
+    const std::string why =
+        format("with it the file would have %llu bytes and may have %llu",
+               std::uint64_t{bytes->size()}, std::uint64_t{limits::kPreferenceFileBytes});
+    // Encoding anew after each of many small changes would take for ever.
+    std::size_t excess = bytes->size() - limits::kPreferenceFileBytes;
+    while (excess > 0 && !changes.empty()) {
+      const auto [size, key] = std::move(changes.back());
+      changes.pop_back();
+      drop(key, why);
+      excess -= std::min(excess, size);
+    }
+    bytes = propertyLists_.encodeXml(merged);
+  }
+  return bytes;
 }
 
 Status FilePreferences::setAside(const std::string& path, std::string_view fault) {

@@ -7,6 +7,9 @@
 // written in the meantime survive. A domain without changes costs no write. On destruction every
 // changed domain is synchronised.
 //
+// A change that no property list can hold, that needs more than 1 MiB or that no longer fits into
+// the file is dropped with a line, so that the other changes of its domain are written.
+//
 // A file that is no property list is reported once, reads as empty, and is set aside as
 // "<domain>.plist.corrupt-<stamp>" when the domain is next written.
 #pragma once
@@ -69,7 +72,10 @@ class FilePreferences final : public Preferences {
   const plist::Dictionary& storedOf(Domain& domain, std::string_view name);
   bool synchronize(Domain& domain, std::string_view name);
   Status writeChanges(Domain& domain, std::string_view name);
-  void dropChangesWithoutText(Domain& domain, plist::Dictionary& merged, std::string_view name);
+  /// `merged`, which is `stored` with the domain's changes, as XML. Changes that no file can hold
+  /// or that do not fit into this one are dropped from both, with a line each.
+  Expected<std::string> encodeWhatFits(Domain& domain, const plist::Dictionary& stored,
+                                       plist::Dictionary& merged, std::string_view name);
   Status setAside(const std::string& path, std::string_view fault);
 
   std::string folder_;

@@ -1,7 +1,6 @@
 #include "platform/linux/file_submission.h"
 
 #include <algorithm>
-#include <tuple>
 #include <utility>
 
 #include "base/limits.h"

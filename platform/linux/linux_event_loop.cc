@@ -108,14 +108,17 @@ EventLoop::Slice LinuxEventLoop::runSlice(std::chrono::milliseconds longest) {
     // Asked for first each time: a crowd of ready sources must not stand before it.
     if (takeSignal()) return Slice::Terminated;
 
-    if (!openPoll()) {
-      std::this_thread::sleep_until(deadline);
-      return Slice::TimedOut;
-    }
     // Only one at a time: the kernel moves what it reported to the end of its list, which is fair,
     // and no event is left over that belongs to a source that a callback has removed.
     epoll_event event;
-    if (epoll_wait(poll_.get(), &event, 1, millisecondsUntil(deadline)) != 1) continue;
+    const bool isOpen = openPoll();
+    const int ready = isOpen ? epoll_wait(poll_.get(), &event, 1, millisecondsUntil(deadline)) : -1;
+    if (ready < 0 && (!isOpen || errno != EINTR)) {
+      // Nothing can be waited for, and asking again would only spin.
+      std::this_thread::sleep_until(deadline);
+      break;
+    }
+    if (ready != 1) continue;
     const auto found = callbacks_.find(event.data.u64);
     if (found == callbacks_.end()) continue;
     // Shared, because the callback may end its own source.

@@ -37,6 +37,15 @@ std::string_view trimmed(std::string_view line) {
   return line.substr(first, line.find_last_not_of(kBlank) - first + 1);
 }
 
+/// Callers take every entry for a text.
+plist::Dictionary stringsOf(const plist::Dictionary& dictionary) {
+  auto strings = plist::Dictionary::create(dictionary.size());
+  for (const auto& [key, value] : dictionary) {
+    if (value.kind() == plist::Kind::String) strings.set(key, value);
+  }
+  return strings;
+}
+
 }  // namespace
 
 std::optional<std::string> osReleaseValue(std::string_view text, std::string_view name) {
@@ -74,8 +83,8 @@ std::string LinuxSystemVersion::text() {
 
 const plist::Dictionary& LinuxSystemVersion::known() {
   if (known_) return known_;
-  known_ = readDictionaryFile(files_, propertyLists_, log_, root_.path(kVersionFile));
-  if (!known_) known_ = fromOsRelease();
+  const auto file = readDictionaryFile(files_, propertyLists_, log_, root_.path(kVersionFile));
+  known_ = file ? stringsOf(file) : fromOsRelease();
   return known_;
 }
 

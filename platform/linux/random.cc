@@ -6,6 +6,7 @@
 #include <unistd.h>
 
 #include "base/text.h"
+#include "base/uuid.h"
 
 namespace tavrel {
 namespace {
@@ -44,19 +45,6 @@ std::string randomName() {
   std::string name;
   appendHex(name, bytes);
   return name;
-}
-
-std::string uuidText(const std::array<std::byte, 16>& bytes) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
-  std::string text;
-  text.reserve(36);
-  for (std::size_t i = 0; i < bytes.size(); ++i) {
-    if (i == 4 || i == 6 || i == 8 || i == 10) text += '-';
-    const unsigned byte = std::to_integer<unsigned>(bytes[i]);
-    text += kDigits[byte >> 4];
-    text += kDigits[byte & 15U];
-  }
-  return text;
 }
 
 std::string randomUuidText() {

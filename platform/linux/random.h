@@ -14,9 +14,6 @@ void fillRandom(MutableByteSpan bytes);
 /// Eight random bytes as 16 hexadecimal digits.
 std::string randomName();
 
-/// 16 bytes as the text of a UUID, in capitals.
-std::string uuidText(const std::array<std::byte, 16>& bytes);
-
 /// The text of a new random UUID (version 4).
 std::string randomUuidText();
 

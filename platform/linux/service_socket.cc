@@ -26,8 +26,8 @@ std::string serviceFile(const DeviceRoot& root, std::string_view name, std::stri
   return root.path(path);
 }
 
-Descriptor newSocket() {
-  return Descriptor(socket(AF_UNIX, SOCK_SEQPACKET | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
+Descriptor newSocket(int type) {
+  return Descriptor(socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
 }
 
 /// Makes way for a socket at `path`; the caller holds the lock of the service.
@@ -40,8 +40,10 @@ Status removeStale(const std::string& path, const SocketAddress& address) {
   if (!S_ISSOCK(status.st_mode)) {
     return Error{format("cannot listen at %s: the file there is no socket; remove it", path)};
   }
-  // The service manager may listen without the lock.
-  const Descriptor probe = newSocket();
+  // The service manager listens without the lock, and would start the service for a connection. A
+  // socket of another type never becomes one: it is refused as such where somebody listens, and as
+  // without an owner where nobody does.
+  const Descriptor probe = newSocket(SOCK_DGRAM);
   if (!probe) return systemError("open a socket for", path);
   if (connect(probe.get(), address.get(), address.size()) == 0 || errno != ECONNREFUSED) {
     return Error{format("cannot listen at %s: another process listens there", path)};
@@ -101,7 +103,7 @@ Expected<ServiceSocket> ServiceSocket::open(const DeviceRoot& root, std::string_
   if (!address) return address.error();
   if (const auto removed = removeStale(path, *address); !removed) return removed.error();
 
-  ServiceSocket result(newSocket());
+  ServiceSocket result(newSocket(SOCK_SEQPACKET));
   if (!result.socket_) return systemError("open a socket for", path);
   // The file gets the mode that its socket has: there is no moment in which others may connect.
   if (fchmod(result.get(), 0600) != 0 || bind(result.get(), address->get(), address->size()) != 0 ||

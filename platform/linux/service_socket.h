@@ -1,6 +1,7 @@
 // Where named services are found: a sequenced-packet socket below the device root,
-// "/run/tavrel/NAME.socket", with "NAME.lock" beside it, which the process that listens holds
-// locked.
+// "/run/tavrel/NAME.socket", with "NAME.lock" beside it, which a process that made the socket
+// itself holds locked. The service manager holds no lock; that it listens is found without
+// connecting.
 #pragma once
 
 #include <string>

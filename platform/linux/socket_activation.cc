@@ -1,5 +1,6 @@
 #include "platform/linux/socket_activation.h"
 
+#include <cerrno>
 #include <charconv>
 #include <cstdlib>
 #include <cstring>

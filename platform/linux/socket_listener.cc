@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <sys/timerfd.h>
 #include <unistd.h>
 #include <utility>
 #include <variant>
@@ -11,29 +12,12 @@
 
 namespace tavrel {
 
-RefusalLog::~RefusalLog() {
-  sayLeftOut();
-}
+namespace {
 
-void RefusalLog::sayLeftOut() {
-  if (leftOut_ > 0) log_.log(LogLevel::Default, "%d more refusals were not logged", leftOut_);
-  leftOut_ = 0;
-}
+/// How long new peers wait when the system is short of something.
+constexpr itimerspec kRetry{.it_interval = {0, 0}, .it_value = {1, 0}};
 
-void RefusalLog::write(std::string_view line) {
-  const auto now = std::chrono::steady_clock::now();
-  if (now - minuteBegan_ >= std::chrono::minutes(1)) {
-    sayLeftOut();
-    minuteBegan_ = now;
-    written_ = 0;
-  }
-  if (written_ == limits::kRefusalLinesPerMinute) {
-    ++leftOut_;
-    return;
-  }
-  ++written_;
-  log_.write(LogLevel::Default, line);
-}
+}  // namespace
 
 class SocketListener::Peer final : public PeerConnection {
  public:
@@ -98,12 +82,17 @@ SocketListener::SocketListener(std::string name, ServiceSocket socket, LinuxEven
       log_(log),
       refusals_(log),
       socket_(std::move(socket)),
-      buffer_(std::make_unique_for_overwrite<std::byte[]>(limits::kPacketBytes)) {}
+      buffer_(std::make_unique_for_overwrite<std::byte[]>(limits::kPacketBytes)),
+      retryTimer_(timerfd_create(CLOCK_MONOTONIC, TFD_CLOEXEC | TFD_NONBLOCK)) {}
 
 SocketListener::~SocketListener() = default;
 
 void SocketListener::resume() {
   if (source_) return;
+  if (!retry_ && retryTimer_) {
+    auto retry = loop_.watch(retryTimer_.get(), [this] { return tryAgain(); });
+    if (retry) retry_ = *std::move(retry);
+  }
   auto source = loop_.watch(socket_.get(), [this] { return acceptPeer(); });
   if (source) {
     source_ = *std::move(source);
@@ -112,10 +101,47 @@ void SocketListener::resume() {
   }
 }
 
-void SocketListener::pause(std::string_view why) {
+void SocketListener::pause() {
   source_.stop();
   paused_ = true;
-  refusals_.write(format("%s: new peers wait until one leaves: %s", name_, why));
+}
+
+void SocketListener::endPause() {
+  if (std::exchange(paused_, false)) resume();
+}
+
+LinuxEventLoop::Activity SocketListener::tryAgain() {
+  std::uint64_t expirations = 0;
+  while (read(retryTimer_.get(), &expirations, sizeof expirations) > 0) {
+  }
+  if (peers_.size() < limits::kServicePeers) endPause();
+  return Activity::Nothing;
+}
+
+void SocketListener::acceptFailed(int code) {
+  switch (code) {
+    case EAGAIN:
+    case EINTR:
+    case ECONNABORTED:
+    case EACCES:
+    case EPERM:
+      return;  // about one peer, which has gone
+    case EMFILE:
+    case ENFILE:
+    case ENOBUFS:
+    case ENOMEM:
+      pause();
+      timerfd_settime(retryTimer_.get(), 0, &kRetry, nullptr);
+      if (!std::exchange(isShort_, true)) {
+        refusals_.write(
+            format("%s: new peers wait, tried each second: %s", name_, std::strerror(code)));
+      }
+      return;
+    default:
+      source_.stop();
+      log_.log(LogLevel::Error, "%s: no further peers are taken: %s; restart the service", name_,
+               std::strerror(code));
+  }
 }
 
 bool SocketListener::admits(const ucred& user) {
@@ -129,11 +155,10 @@ bool SocketListener::admits(const ucred& user) {
 LinuxEventLoop::Activity SocketListener::acceptPeer() {
   Descriptor socket(accept4(socket_.get(), nullptr, nullptr, SOCK_CLOEXEC | SOCK_NONBLOCK));
   if (!socket) {
-    if (errno == EMFILE || errno == ENFILE || errno == ENOBUFS || errno == ENOMEM) {
-      pause(std::strerror(errno));
-    }
+    acceptFailed(errno);
     return Activity::Nothing;
   }
+  isShort_ = false;
   ucred user{};
   socklen_t size = sizeof user;
   if (getsockopt(socket.get(), SOL_SOCKET, SO_PEERCRED, &user, &size) != 0 || !admits(user)) {
@@ -144,7 +169,9 @@ LinuxEventLoop::Activity SocketListener::acceptPeer() {
   const auto& peer =
       peers_.emplace(id, std::make_unique<Peer>(*this, id, std::move(socket), user)).first->second;
   if (peers_.size() == limits::kServicePeers) {
-    pause(format("there are %llu", std::uint64_t{peers_.size()}));
+    pause();
+    refusals_.write(format("%s: new peers wait until one leaves: there are %llu", name_,
+                           std::uint64_t{peers_.size()}));
   }
   if (peerHandler_) peerHandler_(*peer);
   if (peer->hasFailed()) {
@@ -158,8 +185,7 @@ LinuxEventLoop::Activity SocketListener::acceptPeer() {
 
 void SocketListener::release(std::uint64_t peerId) {
   peers_.erase(peerId);
-  if (!std::exchange(paused_, false)) return;
-  resume();
+  endPause();
 }
 
 }  // namespace tavrel

@@ -1,40 +1,20 @@
 // A listening service socket and its peers. See socket_service.h for the rules.
 #pragma once
 
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <string_view>
 #include <sys/socket.h>
 #include <unordered_map>
 
 #include "platform/linux/linux_event_loop.h"
+#include "platform/linux/refusal_log.h"
 #include "platform/linux/service_socket.h"
 #include "platform/named_service.h"
 #include "platform/system_log.h"
 
 namespace tavrel {
-
-/// Writes lines about refusals until there were enough of them for a minute, and then says how many
-/// were left out.
-class RefusalLog {
- public:
-  explicit RefusalLog(SystemLog& log) : log_(log) {}
-  RefusalLog(const RefusalLog&) = delete;
-  RefusalLog& operator=(const RefusalLog&) = delete;
-  ~RefusalLog();
-  void write(std::string_view line);
-
- private:
-  void sayLeftOut();
-
-  SystemLog& log_;
-  std::chrono::steady_clock::time_point minuteBegan_{};
-  int written_ = 0;
-  int leftOut_ = 0;
-};
 
 class SocketListener final : public ServiceListener {
  public:
@@ -51,7 +31,10 @@ class SocketListener final : public ServiceListener {
   Activity acceptPeer();
   /// True for a user who may use the service; says so in the log when not.
   bool admits(const ucred& user);
-  void pause(std::string_view why);
+  void acceptFailed(int code);
+  void pause();
+  void endPause();
+  Activity tryAgain();
   void release(std::uint64_t peerId);
 
   std::string name_;
@@ -66,6 +49,9 @@ class SocketListener final : public ServiceListener {
   std::uint64_t lastPeerId_ = 0;
   int silentInARow_ = 0;
   bool paused_ = false;
+  bool isShort_ = false;   // of what a new peer needs, when one was last tried
+  Descriptor retryTimer_;  // made in advance: there may be no descriptor when it is needed
+  LinuxEventLoop::Source retry_;
 };
 
 }  // namespace tavrel

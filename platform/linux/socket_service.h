@@ -3,8 +3,8 @@
 //
 //   SocketServices services(loop, root, log);
 //   auto listener = services.createListener("com.norvane.tallied.tavrel");
-//   listener->setPeerHandler([](PeerConnection& peer) { peer.setEventHandler(...); peer.resume();
-//   }); listener->resume();
+//   listener->setPeerHandler(takePeer);  // sets the peer's event handler and resumes it
+//   listener->resume();
 //
 // Who may talk: root and the user that this process runs as. Others are refused, and so are packets
 // that are no message: the peer is dropped with a log line, of which there are at most
@@ -17,9 +17,10 @@
 //   - the closure of a peer that has sent a message.
 // What was refused or dropped never counts.
 //
-// Beyond `limits::kServicePeers` peers, or when there is no descriptor left, new ones wait in the
-// kernel's queue until a peer leaves. Nobody is written to, so a peer that does not read costs
-// nothing; one that writes too fast is held up by the kernel.
+// Beyond `limits::kServicePeers` peers new ones wait in the kernel's queue until a peer leaves;
+// when the system is short of descriptors or memory, also until the next try a second later. Nobody
+// is written to, so a peer that does not read costs nothing; one that writes too fast is held up by
+// the kernel.
 #pragma once
 
 #include <memory>

@@ -10,8 +10,10 @@
 #pragma once
 
 #include <cstdint>
+#include <exception>
 #include <string>
 #include <string_view>
+#include <utility>
 
 struct sqlite3;
 struct sqlite3_stmt;
@@ -27,7 +29,10 @@ enum class StoreFault : std::uint8_t {
 };
 
 /// What failed, why, and what can be done about it; without the store's path.
-struct StoreFailure {
+struct StoreFailure : std::exception {
+  StoreFailure(StoreFault kind, std::string text) : fault(kind), message(std::move(text)) {}
+  const char* what() const noexcept override { return message.c_str(); }
+
   StoreFault fault;
   std::string message;
 };

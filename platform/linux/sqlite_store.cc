@@ -9,6 +9,7 @@
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
+#include "platform/linux/guarded_end.h"
 #include "platform/linux/sqlite_schema.h"
 
 namespace tavrel {
@@ -18,7 +19,7 @@ SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& pref
     : site_{root.path(kStorePath), busyMilliseconds, clock, preferences, log, leavesDamaged} {}
 
 SqliteStore::~SqliteStore() {
-  commit();
+  endGuarded(site_.log, "commit the last statistics", [this] { commit(); });
 }
 
 std::int32_t SqliteStore::BHDaysSince1970() {
@@ -89,10 +90,10 @@ bool SqliteStore::commit() {
 
 void SqliteStore::BHClientCheckpoint() {
   commit();
-  // A store that nobody has written to yet has no log to move.
-  if (!FileIdentity::of(site_.path)) return;
+  // The last process that closes the store empties its log and removes it.
+  if (!FileIdentity::of(site_.path + "-wal")) return;
   const auto failure = attempt([this](const auto& identity) {
-    // Just set aside: there is nothing in the log of a new store.
+    // Just set aside, and the log with it.
     if (!identity) return;
     SqliteConnection connection = openForWriting();
     if (!connection.checkpoint()) {

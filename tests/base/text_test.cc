@@ -10,6 +10,7 @@
 
 #include "base/civil_time.h"
 #include "base/utf8.h"
+#include "base/uuid.h"
 
 namespace tavrel {
 namespace {
@@ -177,6 +178,21 @@ TEST(Utf8, TellsWellFormedFromMalformed) {
     std::string_view rest = text;
     ASSERT_EQ(takeCodePoint(rest), exists ? codePoint : kReplacementCharacter);
     ASSERT_TRUE(rest.empty());
+  }
+}
+
+TEST(UuidTest, WritesAndNormalises) {
+  UuidBytes bytes;
+  for (std::size_t i = 0; i < bytes.size(); ++i)
+    bytes[i] = static_cast<std::byte>(i * 0x11);
+  const std::string text = "00112233-4455-6677-8899-AABBCCDDEEFF";
+  EXPECT_EQ(uuidText(bytes), text);
+  EXPECT_EQ(normalisedUuid(text), text);
+  EXPECT_EQ(normalisedUuid("00112233-4455-6677-8899-aabbccddeeff"), text);
+  for (const char* other :
+       {"", "00112233-4455-6677-8899-aabbccddeef", "00112233+4455-6677-8899-aabbccddeeff",
+        "0011223g-4455-6677-8899-aabbccddeeff", "00112233-4455-6677-8899aabb-ccddeeff"}) {
+    EXPECT_EQ(normalisedUuid(other), std::nullopt) << other;
   }
 }
 

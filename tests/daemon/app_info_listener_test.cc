@@ -26,24 +26,6 @@ Dictionary app(const plist::Value& uuid) {
   return {{"bundle_id", "com.example.walk"}, {"version", "1.2"}, {"uuid", uuid}};
 }
 
-TEST(AppInfoTest, ReadsUuidsAsBytesAndAsText) {
-  const std::pair<plist::Value, std::optional<std::string>> kCases[] = {
-      {uuidBytes(), kUuid},
-      {kUuid, kUuid},
-      {"00112233-4455-6677-8899-aabbccddeeff", kUuid},
-      {"00112233-4455-6677-8899-aabbccddeef", std::nullopt},
-      {"00112233+4455-6677-8899-aabbccddeeff", std::nullopt},
-      {"0011223g-4455-6677-8899-aabbccddeeff", std::nullopt},
-      {"00112233-4455-6677-8899aabb-ccddeeff", std::nullopt},
-      {uuidBytes(15), std::nullopt},
-      {uuidBytes(17), std::nullopt},
-      {16, std::nullopt},
-      {{}, std::nullopt},
-  };
-  for (const auto& [uuid, text] : kCases)
-    EXPECT_EQ(uuidText(uuid), text) << textOf(uuid);
-}
-
 TEST(AppInfoTest, ConvertsElementsInOrderAndLeavesIncompleteOnesOut) {
   Dictionary full = app(uuidBytes());
   full.set("orbo_id", std::int64_t{-9223372036854775807});
@@ -51,8 +33,8 @@ TEST(AppInfoTest, ConvertsElementsInOrderAndLeavesIncompleteOnesOut) {
   full.set("other", "dropped");
   Dictionary withoutVersion = app(kUuid);
   withoutVersion.remove("version");
-  const Array entries =
-      appInfoFrom({full, "no dictionary", withoutVersion, app("bad"), app(kUuid)});
+  const Array entries = appInfoFrom(
+      {full, "no dictionary", withoutVersion, app("bad"), app(uuidBytes(15)), app(16), app(kUuid)});
   EXPECT_EQ(entries, (Array{Dictionary{{"bundle", "com.example.walk"},
                                        {"version", "1.2"},
                                        {"orboID", std::int64_t{-9223372036854775807}},
@@ -120,6 +102,11 @@ TEST_F(ListenerTest, RunsTheDayWithTheInformationDelivered) {
   EXPECT_EQ(runs(), 1);
 }
 
+TEST_F(ListenerTest, RunsTheDayWithAnEmptyList) {
+  EXPECT_EQ(serve({kAnnounce, Dictionary{{"operation", 2}, {"app_data", Array::create()}}}),
+            (Messages{kAnnounced, "tavrel got requestedAAI:\n[]", "daily tasks for day 19999"}));
+}
+
 TEST_F(ListenerTest, RunsTheDayWithoutInformationThatNeverCame) {
   EXPECT_EQ(serve({kAnnounce, kAnnounce}),
             (Messages{kAnnounced, kNeverCame, "daily tasks for day 19999"}));
@@ -129,7 +116,13 @@ TEST_F(ListenerTest, RunsTheDayWithoutInformationThatNeverCame) {
 TEST_F(ListenerTest, IgnoresWhatNobodyAskedFor) {
   EXPECT_EQ(serve({kDeliver}), Messages{"tavrel got (unsolicited -- so ignoring) AAI:\n" + kList});
   EXPECT_EQ(runs(), 0);
-  EXPECT_EQ(serve({{}, "text", Array{1}, Dictionary{{"operation", "0"}}, Dictionary::create()}),
+  EXPECT_EQ(serve({{},
+                   "text",
+                   Array{1},
+                   Dictionary{{"operation", "0"}},
+                   Dictionary::create(),
+                   Dictionary{{"operation", 0.0}},
+                   Dictionary{{"operation", 2}}}),
             Messages{});
   // Messages of unknown shape leave the announcement open, those with another number do not.
   EXPECT_EQ(serve({{}, kAnnounce}).size(), 3U);
@@ -145,6 +138,10 @@ TEST_F(ListenerTest, ForcesADayOnce) {
   EXPECT_EQ(serve({Dictionary{{"operation", (std::int64_t{7} << 32) + 1},
                               {"value", (std::int64_t{7} << 32) - 5}}}),
             Messages{"daily tasks for day -5"});
+  // Without a day, or with one that is no integer, a message is of unknown shape.
+  EXPECT_EQ(serve({Dictionary{{"operation", 1}}, Dictionary{{"operation", 1}, {"value", 2.0}},
+                   Dictionary{{"operation", 1}, {"value", 7}}}),
+            Messages{"daily tasks for day 7"});
 }
 
 TEST_F(ListenerTest, WaitsAlsoWithoutAListener) {

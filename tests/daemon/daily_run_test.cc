@@ -3,8 +3,8 @@
 #include <gtest/gtest.h>
 #include <limits>
 
+#include "config/persisted_state.h"
 #include "daemon/entry.h"
-#include "report/bh_report.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

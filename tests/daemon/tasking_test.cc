@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "report/bh_report.h"
+#include "config/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

@@ -76,10 +76,12 @@ struct FakeDistribution : BHHistoryDistributionEnumerator {
   }
   std::vector<Sample> samples;
   bool wasRead = false;
+  bool fails = false;  // behind the values
 
   std::span<const Sample> nextBlock() override {
-    if (std::exchange(wasRead, true)) return {};
-    return samples;
+    if (!std::exchange(wasRead, true)) return samples;
+    if (fails) fail();
+    return {};
   }
 };
 

@@ -160,11 +160,23 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   EXPECT_EQ(process.log.lines.size(), 2U);
   EXPECT_EQ(process.all(), R"({"a":1,"good":2})");
 
-  process.set("huge", std::string(limits::kPreferenceFileBytes, 'x'));
-  EXPECT_FALSE(process.synchronize());
-  process.set("huge", {});
+  // Nor does one that is too large alone, nor several that are too large together: the largest
+  // goes.
+  process.set("good", std::string(1U << 20, 'x'));
+  for (std::size_t i = 0; i < 9; ++i)
+    process.set("large" + std::to_string(i), std::string((1000 + i) << 10, 'x'));
+  process.set("gate", 20783);
   EXPECT_TRUE(process.synchronize());
-  EXPECT_EQ(Process(device.root).all(), R"({"a":1,"good":2})");
+  ASSERT_EQ(process.log.lines.size(), 4U);
+  const std::string begin = "cannot write preference \"";
+  EXPECT_EQ(process.log.lines[2].find(begin + "good\" of domain com.example.domain: it needs 104"),
+            0U);
+  EXPECT_EQ(
+      process.log.lines[3].find(begin + "large8\" of domain com.example.domain: with it the "), 0U);
+  Process later(device.root);
+  EXPECT_EQ(later.get("gate") + later.get("good"), "207832") << "a dropped change leaves the old";
+  EXPECT_EQ(later.get("large7").size(), 1007U << 10);
+  EXPECT_EQ(later.get("large8"), "(null)");
 }
 
 TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {

@@ -7,6 +7,7 @@
 #include <memory>
 #include <string>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
@@ -18,9 +19,11 @@
 #include "platform/linux/service_client.h"
 #include "platform/linux/service_message.h"
 #include "platform/linux/service_socket.h"
+#include "platform/linux/socket_listener.h"
 #include "platform/linux/socket_service.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
+#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -31,32 +34,11 @@ using Slice = EventLoop::Slice;
 constexpr std::string_view kName = "com.norvane.tallied.tavrel";
 constexpr int kAllSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
 
-struct RecordingLog final : SystemLog {
-  void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
-  bool says(std::string_view part) const {
-    for (const auto& line : lines) {
-      if (line.find(part) != std::string::npos) return true;
-    }
-    return false;
-  }
-  std::vector<std::string> lines;
-};
-
 /// A service below a root of its own that notes what its peers send.
 class ServiceTest : public testing::Test {
  protected:
-  void SetUp() override {
-    std::string pattern = testing::TempDir() + "tavrel-service-XXXXXX";
-    ASSERT_NE(mkdtemp(pattern.data()), nullptr);
-    useRoot(pattern);
-  }
-  void TearDown() override {
-    listener.reset();
-    std::filesystem::remove_all(folder);
-  }
-
   void useRoot(const std::string& path) {
-    folder = path;
+    listener.reset();
     root = std::make_unique<DeviceRoot>(path);
     services = std::make_unique<SocketServices>(loop, *root, log);
   }
@@ -122,20 +104,13 @@ class ServiceTest : public testing::Test {
       count += entry.exists() || entry.is_symlink();
     return count;
   }
-  /// The exit status of `body` in a process of its own.
-  static int inChild(const std::function<int()>& body) {
-    const pid_t child = fork();
-    if (child == 0) _exit(body());
-    int status = 0;
-    EXPECT_EQ(waitpid(child, &status, 0), child);
-    return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
-  }
 
-  std::string folder;
-  RecordingLog log;
+  TemporaryRoot device;
+  const std::string folder = device.root.path("");
+  KeptLog log;
   LinuxEventLoop loop;
-  std::unique_ptr<DeviceRoot> root;
-  std::unique_ptr<SocketServices> services;
+  std::unique_ptr<DeviceRoot> root = std::make_unique<DeviceRoot>(folder);
+  std::unique_ptr<SocketServices> services = std::make_unique<SocketServices>(loop, *root, log);
   std::unique_ptr<ServiceListener> listener;
   std::vector<plist::Dictionary> messages;
   int peers = 0;
@@ -167,7 +142,6 @@ TEST_F(ServiceTest, DeliversMessagesOfBothSizesAndEncodingsInOrder) {
     EXPECT_FALSE(std::filesystem::exists(serviceSocketPath(*root, kName)));
   }
   EXPECT_EQ(log.lines, std::vector<std::string>());
-  folder.resize(folder.rfind('/'));
 }
 
 TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
@@ -276,6 +250,35 @@ TEST_F(ServiceTest, PeersBeyondTheLimitWaitForAPlace) {
   EXPECT_EQ(messages.size(), 1U);
 }
 
+TEST_F(ServiceTest, PeersWaitWhileThereIsNoDescriptor) {
+  listen();
+  ServiceClient client = connect();
+  rlimit before;
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+  EXPECT_EQ(drain(), 0);
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &before), 0);
+  EXPECT_EQ(log.lines,
+            std::vector<std::string>{std::string(kName) +
+                                     ": new peers wait, tried each second: Too many open files"});
+  EXPECT_EQ(loop.runSlice(1h), Slice::HandledEvent) << "although no peer has left";
+  EXPECT_EQ(peers, 1);
+}
+
+TEST_F(ServiceTest, ASocketThatFailsForGoodIsToldOnceAndLeft) {
+  auto socket = ServiceSocket::open(*root, kName);
+  ASSERT_TRUE(socket);
+  const int descriptor = socket->get();
+  SocketListener broken("name", *std::move(socket), loop, log);
+  broken.resume();
+  ASSERT_EQ(shutdown(descriptor, SHUT_RDWR), 0);
+  EXPECT_EQ(drain(), 0);
+  EXPECT_EQ(log.lines,
+            std::vector<std::string>{
+                "name: no further peers are taken: Invalid argument; restart the service"});
+}
+
 TEST_F(ServiceTest, SilentPeersStopCountingAsEvents) {
   listen();
   const auto silentEvents = [this] {
@@ -338,6 +341,7 @@ TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
   log.lines.clear();
   EXPECT_EQ(services->createListener(kName), nullptr);
   EXPECT_TRUE(log.says("another process listens there"));
+  EXPECT_EQ(drain(), 0) << "a look at the socket is no peer, for whom it would be started";
   listener.reset();
 
   std::filesystem::create_directory(socket);
@@ -428,6 +432,19 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   for (const pid_t child : posters)
     waitpid(child, nullptr, 0);
 
+  // A damaged counter holds nobody up.
+  for (const std::string damaged : {std::string(), std::string("-1\n"), std::string(99, '1')}) {
+    device.write("/run/tavrel/notifications/" + std::string(kNotification), damaged);
+    log.lines.clear();
+    notifications.post(kNotification);
+    EXPECT_TRUE(log.lines.size() == 1 && log.says("; counting begins anew at "));
+    EXPECT_GT(*notifications.count(kNotification), seen);
+    seen = *notifications.tryPost(kNotification);
+    EXPECT_EQ(*notifications.count(kNotification), seen);
+  }
+  EXPECT_EQ(log.lines.size(), 1U);
+
+  log.lines.clear();
   notifications.post("../escape");
   EXPECT_EQ(log.lines, std::vector<std::string>{"cannot post ../escape: ../escape is not the name "
                                                 "of a notification"});

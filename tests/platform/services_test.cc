@@ -95,9 +95,11 @@ TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
   Services device;
   device.write("/etc/tavrel/system-version.plist",
                "<plist version=\"1.0\"><dict><key>ProductName</key><string>Pellio</string>"
+               "<key>ProductVersion</key><integer>4</integer>"
                "<key>ProductBuildVersion</key><string>16R349</string></dict></plist>");
   device.version.systemVersionDictionary().set("ProductName", "changed");
   EXPECT_EQ(device.version.text(), "Pellio (16R349)");
+  EXPECT_EQ(device.version.systemVersionDictionary().size(), 2U) << "only texts";
 }
 
 TEST(Facts, AFileThatCannotServeIsToldOnceAndLeftOut) {

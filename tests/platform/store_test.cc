@@ -2,7 +2,6 @@
 #include <bit>
 #include <csignal>
 #include <filesystem>
-#include <fstream>
 #include <gtest/gtest.h>
 #include <iterator>
 #include <limits>
@@ -15,7 +14,11 @@
 #include <unistd.h>
 #include <vector>
 
+#include "faulty_file_layer.h"
+#include "fixed_clock.h"
+#include "platform/linux/file_preferences.h"
 #include "platform/linux/sqlite_store.h"
+#include "platform/plist/coding.h"
 #include "temporary_root.h"
 
 namespace tavrel {
@@ -25,30 +28,7 @@ constexpr std::int32_t kFirstDay = std::numeric_limits<std::int32_t>::min();
 constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
 constexpr std::int64_t kSmallest = std::numeric_limits<std::int64_t>::min();
 constexpr std::int64_t kLargest = std::numeric_limits<std::int64_t>::max();
-constexpr std::int32_t kToday = 20781;
-
-struct SetClock : Clock {
-  plist::Date now() override { return instant; }
-  std::uint64_t ticks() override { return 0; }
-  std::optional<TimeBase> timeBase() override { return TimeBase{1, 1}; }
-  plist::Date instant = plist::Date::since1970(kToday * 86400.0 + 80000);
-};
-
-struct HeldPreferences : Preferences {
-  plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) override {
-    return values[std::string(domain) + "/" + std::string(key)];
-  }
-  void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
-                              std::string_view domain) override {
-    values[std::string(domain) + "/" + std::string(key)] = value;
-  }
-  bool ZTXPreferencesSynchronize(std::string_view domain) override {
-    synchronised.emplace_back(domain);
-    return true;
-  }
-  std::map<std::string, plist::Value> values;
-  std::vector<std::string> synchronised;
-};
+constexpr std::int32_t kToday = 20784;
 
 struct Row {
   std::string key;
@@ -62,11 +42,6 @@ void PrintTo(const Row& row, std::ostream* out) {
 using Rows = std::vector<Row>;
 
 using Sample = BHHistoryDistributionEnumerator::Sample;
-
-std::string contentOf(const std::string& path) {
-  std::ifstream stream(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(stream), {}};
-}
 
 class StoreTest : public testing::Test {
  protected:
@@ -83,6 +58,7 @@ class StoreTest : public testing::Test {
         });
     return rows;
   }
+  std::string read(const std::string& path) { return *files_.read(path, 1U << 24); }
   Rows scalarsOfToday() { return scalars(*store_->initWithDefaultPath(), "", kToday - 1, kToday); }
 
   static std::vector<Sample> take(BHHistoryDistributionEnumerator& values) {
@@ -138,9 +114,11 @@ class StoreTest : public testing::Test {
   }
 
   TemporaryRoot root_;
-  SetClock clock_;
-  HeldPreferences preferences_;
+  FixedClock clock_;
   KeptLog log_;
+  QuickFileLayer files_;
+  plist::PlistCoding propertyLists_;
+  FilePreferences preferences_{root_.root, files_, propertyLists_, clock_, log_};
   std::unique_ptr<SqliteStore> store_ = open();
 };
 
@@ -300,22 +278,6 @@ TEST_F(StoreTest, ReadsOnlyTheValuesThatAreAskedFor) {
   EXPECT_EQ(corruptions(), 0);
 }
 
-TEST_F(StoreTest, TheDaysQueryIsOneWalkAlongTheKey) {
-  set({{"a", kToday, 1}});
-  const auto plan = [&](std::string_view query) {
-    return sql("EXPLAIN QUERY PLAN " + std::string(query));
-  };
-  EXPECT_EQ(plan(store_sql::kScalarsOfDay),
-            (std::vector<std::string>{"SEARCH scalars USING PRIMARY KEY (day=? AND key>?)"}));
-  EXPECT_EQ(plan(store_sql::kDistributionsOfDay),
-            (std::vector<std::string>{"SEARCH distributions USING PRIMARY KEY (day=? AND key>?)"}));
-  EXPECT_EQ(plan(store_sql::kScalarsByDay),
-            (std::vector<std::string>{"SEARCH scalars USING PRIMARY KEY (day>? AND day<?)"}));
-  EXPECT_EQ(
-      plan(store_sql::kChunks),
-      (std::vector<std::string>{"SEARCH chunks USING INTEGER PRIMARY KEY (rowid>? AND rowid<?)"}));
-}
-
 TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
   EXPECT_EQ(store_->BHDaysSince1970(), kToday);
   EXPECT_EQ(store_->dateForDaysSince1970(kFirstDay).secondsSince1970(), -185542587187200.0);
@@ -327,7 +289,7 @@ TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
 
   store_->BHClientSetValueForScalarKey("k", 1);
   store_->BHClientSetValueForScalarKey("k", 2);
-  clock_.instant = plist::Date::since1970((kToday + 1) * 86400.0);
+  clock_.time = plist::Date::since1970((kToday + 1) * 86400.0);
   store_->BHClientSetValueForScalarKey("k", 3);
   const auto reader = open();
   EXPECT_EQ(scalars(*reader->initWithDefaultPath(), "", kSmallest, kLargest), Rows{});
@@ -357,9 +319,9 @@ TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
   store_.reset();
   EXPECT_EQ(scalars(*idle, "end", kSmallest, kLargest), (Rows{{"end", kToday + 1, 5}}));
 
-  clock_.instant = plist::Date::since1970(1e300);
+  clock_.time = plist::Date::since1970(1e300);
   EXPECT_EQ(open()->BHDaysSince1970(), kLastDay);
-  clock_.instant = plist::Date::since1970(-0.5);
+  clock_.time = plist::Date::since1970(-0.5);
   EXPECT_EQ(open()->BHDaysSince1970(), -1);
 }
 
@@ -389,12 +351,12 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   for (int i = 0; i < 500; ++i)
     store_->BHClientSetValueForScalarKey("k" + std::to_string(i), i);
   store_->BHClientCheckpoint();
-  const std::string good = contentOf(store_->path());
+  const std::string good = read(store_->path());
   sql("CREATE TABLE more (x); PRAGMA user_version = 2");
-  const std::string later = contentOf(store_->path());
+  const std::string later = read(store_->path());
   std::filesystem::remove(store_->path());
   sql("CREATE TABLE theirs (x)");
-  const std::string foreign = contentOf(store_->path());
+  const std::string foreign = read(store_->path());
 
   std::string flipped = good;
   for (std::size_t i = 4096; i < flipped.size(); i += 7)
@@ -427,7 +389,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
         std::filesystem::remove(store_->path() + suffix);
       root_.write(kStorePath, item.content);
       log_.lines.clear();
-      preferences_.values.clear();
+      preferences_.ZTXPreferencesSetValue("DatabaseCorruptionCount", {}, "com.norvane.tallied");
 
       if (byReader) {
         scalarsOfToday();
@@ -437,19 +399,19 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
       }
       const std::string where = "statistics store " + store_->path() + ": ";
       if (item.damaged) {
-        const std::string aside = store_->path() + ".corrupt-20261124T221320Z";
+        const std::string aside = store_->path() + ".corrupt-20261127T180218Z";
         ASSERT_EQ(log_.lines.size(), byReader ? log_.lines.size() : 1U);
         EXPECT_EQ(log_.lines[0], where + item.reason +
                                      ": the file has to be set aside; it is now " + aside +
                                      " and a new store is begun: inspect or remove that file");
-        EXPECT_EQ(contentOf(aside), item.content);
+        EXPECT_EQ(read(aside), item.content);
         EXPECT_EQ(corruptions(), 1);
       } else {
         EXPECT_EQ(setAsideFiles(), std::vector<std::string>{});
         EXPECT_EQ(corruptions(), 0);
         if (item.reason) {
           EXPECT_EQ(log_.lines[0].substr(0, (where + item.reason).size()), where + item.reason);
-          EXPECT_EQ(contentOf(store_->path()), item.content);
+          EXPECT_EQ(read(store_->path()), item.content);
         }
       }
       const bool kept = !item.reason || item.damaged;

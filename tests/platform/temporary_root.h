@@ -1,12 +1,16 @@
-// A device root in a temporary folder, and a system log that is kept.
+// What most tests of the platform need: a device root in a temporary folder, a system log that is
+// kept, and processes.
 #pragma once
 
+#include <algorithm>
 #include <filesystem>
 #include <fstream>
+#include <functional>
 #include <gtest/gtest.h>
 #include <stdlib.h>
 #include <string>
 #include <string_view>
+#include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
 
@@ -52,7 +56,21 @@ class TemporaryRoot {
 class KeptLog final : public SystemLog {
  public:
   void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
+  bool says(std::string_view part) const {
+    return std::any_of(lines.begin(), lines.end(), [part](const std::string& line) {
+      return line.find(part) != std::string::npos;
+    });
+  }
   std::vector<std::string> lines;
 };
+
+/// The exit status of `body` in a process of its own.
+inline int inChild(const std::function<int()>& body) {
+  const pid_t child = fork();
+  if (child == 0) _exit(body());
+  int status = 0;
+  EXPECT_EQ(waitpid(child, &status, 0), child);
+  return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
+}
 
 }  // namespace tavrel

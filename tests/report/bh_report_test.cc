@@ -1,3 +1,4 @@
+#include "config/persisted_state.h"
 #include "report/bh_report.h"
 
 #include <gtest/gtest.h>
@@ -93,6 +94,9 @@ TEST_F(BHReportTest, KeepsTheLaterRowOfADistribution) {
   fakes::FakeDistribution first({1, 2});
   fakes::FakeDistribution none({});
   fakes::FakeDistribution single({7});
+  fakes::FakeDistribution broken({1, 2});
+  broken.fails = true;
+  report.computeAndAddDistribution(broken, "broken", options);
   report.computeAndAddDistribution(first, "replaced", options);
   report.computeAndAddDistribution(none, "replaced", options);
   report.computeAndAddDistribution(single, "single", Dictionary::create());

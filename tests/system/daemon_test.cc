@@ -1,0 +1,223 @@
+// The daemon as a process, on a device of its own.
+#include <array>
+#include <filesystem>
+#include <fstream>
+#include <gtest/gtest.h>
+#include <sstream>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include "config/bh_config.h"
+#include "config/persisted_state.h"
+#include "daemon/app_info_listener.h"
+#include "daemon/entry.h"
+#include "platform/linux/descriptor.h"
+#include "platform/linux/file_notifications.h"
+#include "platform/linux/file_submission.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/service_client.h"
+#include "platform/linux/sqlite_batch.h"
+#include "platform/linux/sqlite_store.h"
+#include "platform/plist/xml.h"
+#include "tests/fakes/plist_matching.h"
+#include "tests/platform/temporary_root.h"
+#include "tests/system/child_process.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Array;
+using plist::Dictionary;
+
+/// Runs the daemon in this process.
+void runDaemon(const DeviceRoot& root, const char* argument) {
+  LinuxPlatform linuxPlatform(root);
+  const std::array<const char*, 2> arguments{"tavrel", argument};
+  runTavrel(linuxPlatform.platform(), arguments);
+}
+
+/// A device with permission, a whitelist, a scheduled tasking and yesterday's statistics.
+struct Device {
+  TemporaryRoot folder;
+  const DeviceRoot& root = folder.root;
+  std::int32_t yesterday = 0;
+
+  Device() {
+    const Dictionary keys{{"k", Dictionary::create()}};
+    folder.write(kWhitelistPath,
+                 *plist::writeXml(Dictionary{
+                     {"g", Dictionary{{"ScalarKeys", keys}, {"DistributionKeys", keys}}}}));
+    LinuxPlatform linuxPlatform(root);
+    Platform& platform = linuxPlatform.platform();
+    platform.preferences.ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
+                                                "com.norvane.zentrix");
+    const Dictionary setting{{"Domain", "com.example"}, {"Key", "k"}, {"Value", 7}};
+    platform.preferences.ZTXPreferencesSetValue(
+        kScheduledTaskingKey, Dictionary{{"TaskingID", "t"}, {"TaskingPayload", Array{setting}}},
+        kScheduleDomain);
+    yesterday = platform.statistics.BHDaysSince1970() - 1;
+    auto batch = linuxPlatform.store().beginBatch();
+    static_cast<void>((*batch)->setScalar(yesterday, "k", 42));
+    for (int i = 0; i < 3000; ++i)
+      static_cast<void>((*batch)->appendValue(yesterday, "k", 0, i));
+    EXPECT_TRUE((*batch)->commit());
+  }
+
+  /// The pending logs; each must be whole and have its metadata.
+  std::vector<Dictionary> pendingLogs() const {
+    LinuxPlatform linuxPlatform(root);
+    const auto filed = linuxPlatform.submission().logs(FileSubmission::Place::Pending);
+    EXPECT_TRUE(filed);
+    std::vector<Dictionary> logs;
+    for (const auto& log : *filed) {
+      EXPECT_EQ(log.metadata.string(kLogMetadataType), "193") << log.path;
+      const auto document = plist::readXml(asBytes(contentOf(log.path)));
+      EXPECT_TRUE(document) << log.path;
+      if (!document) continue;
+      EXPECT_EQ(document->dictionary().get("BHScalars"), plist::Value(Dictionary{{"k", 42}}));
+      EXPECT_EQ(document->dictionary().dictionary("BHDistributions").array("k").at(4),
+                plist::Value(3000));
+      logs.push_back(document->dictionary());
+    }
+    return logs;
+  }
+
+  plist::Value preference(std::string_view domain, std::string_view key) const {
+    LinuxPlatform linuxPlatform(root);
+    return linuxPlatform.platform().preferences.ZTXPreferencesGetValue(key, domain);
+  }
+
+  /// Runs the built program and yields what it logged, without the times.
+  std::string logOf(const char* argument) const {
+    const std::string errors = root.path("/errors");
+    const int daemon = forkProcess([&] { execute(argument); }, errors);
+    EXPECT_EQ(waitFor(daemon), 0);
+    std::istringstream lines(contentOf(errors));
+    std::string log;
+    for (std::string line; std::getline(lines, line);)
+      log += line.substr(line.find(' ') + 1) + '\n';
+    return log;
+  }
+
+  /// Becomes the built program.
+  void execute(const char* argument) const {
+    ::setenv("TAVREL_ROOT", root.path("/").c_str(), 1);
+    ::execl(TAVREL_BINARY, "tavrel", argument, nullptr);
+    ::_exit(127);
+  }
+
+  static std::string contentOf(const std::string& path) {
+    std::ostringstream content;
+    content << std::ifstream(path).rdbuf();
+    return content.str();
+  }
+};
+
+TEST(DaemonTest, RunsOnceADayAndByForce) {
+  const Device device;
+  const std::string day = std::to_string(device.yesterday);
+  const std::string first = device.logOf("-d");
+  EXPECT_TRUE(first.starts_with("default tavrel started\ndefault daily tasks for day " + day +
+                                "\ninfo writing tallied log. yesterday=" + day + "\n"))
+      << first;
+  EXPECT_TRUE(first.ends_with("default tavrel ended\n")) << first;
+  EXPECT_EQ(device.logOf("-d"),
+            "default tavrel started\ndefault Day unchanged since last run\ndefault tavrel ended\n");
+  EXPECT_EQ(device.logOf("-x"),
+            "default tavrel started\ndefault Unknown arg: -x\ndefault tavrel ended\n");
+  EXPECT_EQ(device.pendingLogs().size(), 1U);
+  device.logOf("-f");
+  EXPECT_EQ(device.pendingLogs().size(), 2U);
+  EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
+}
+
+/// A listening socket as the service manager would hand it over.
+int listeningSocket(const DeviceRoot& root) {
+  const std::filesystem::path path = root.path("/run/tavrel/com.norvane.tallied.tavrel.socket");
+  std::filesystem::create_directories(path.parent_path());
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  path.string().copy(address.sun_path, sizeof address.sun_path - 1);
+  const int listener = ::socket(AF_UNIX, SOCK_SEQPACKET, 0);
+  EXPECT_EQ(::bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
+  EXPECT_EQ(::listen(listener, 8), 0);
+  return listener;
+}
+
+TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
+  const Device device;
+  const Descriptor listener(listeningSocket(device.root));
+  const int daemon = forkProcess([&] {
+    ::dup2(listener.get(), 3);
+    ::setenv("LISTEN_FDS", "1", 1);
+    ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
+    device.execute(nullptr);
+  });
+
+  KeptLog log;
+  const FileNotifications notifications(device.root, log);
+  auto client = ServiceClient::connect(device.root, kTavrelDomain);
+  ASSERT_TRUE(client) << client.error().message;
+  ASSERT_TRUE(client->send({{"operation", 0}}));
+  const auto asked = notifications.waitBeyond(kLoggingNotification, 0, std::chrono::seconds(60));
+  ASSERT_TRUE(asked);
+  EXPECT_EQ(*asked, 1U);
+  const Dictionary app{{"bundle_id", "com.example.walk"},
+                       {"version", "1.2"},
+                       {"uuid", "00112233-4455-6677-8899-AABBCCDDEEFF"}};
+  ASSERT_TRUE(client->send({{"operation", 2}, {"app_data", Array{app}}}));
+
+  EXPECT_EQ(waitFor(daemon), 0);  // after its ten idle seconds
+  const auto logs = device.pendingLogs();
+  ASSERT_EQ(logs.size(), 1U);
+  EXPECT_EQ(logs[0].array("BHActivatedAppInfo").at(0).dictionary().string("bundle"),
+            "com.example.walk");
+}
+
+TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
+  const Device device;
+  std::vector<int> processes;
+  for (int i = 0; i < 8; ++i) {
+    processes.push_back(forkProcess([&] { runDaemon(device.root, "-f"); }));
+    processes.push_back(forkProcess([&] {
+      LinuxPlatform linuxPlatform(device.root);
+      auto batch = linuxPlatform.store().beginBatch();
+      if (!batch || !(*batch)->addScalar(device.yesterday, "sum", 1) || !(*batch)->commit()) {
+        ::_exit(1);
+      }
+    }));
+  }
+  for (const int process : processes)
+    EXPECT_EQ(waitFor(process), 0);
+  EXPECT_EQ(device.pendingLogs().size(), 8U);
+  std::int64_t sum = 0;
+  LinuxPlatform linuxPlatform(device.root);
+  linuxPlatform.platform().statistics.initWithDefaultPath()->scalarsForKeyPrefix(
+      "sum", device.yesterday - 1, device.yesterday,
+      [&sum](std::string_view, std::int32_t, std::int64_t value, bool&) { sum = value; });
+  EXPECT_EQ(sum, 8);
+}
+
+// A run is killed before one of its system calls, over the whole run; the next one must then find
+// and leave everything whole. A log may have been filed by both.
+TEST(DaemonTest, RecoversWhereverARunIsKilled) {
+  std::size_t kills = 0;
+  for (std::size_t calls = 0;; calls += 5) {
+    const Device device;
+    if (!runUntilSystemCall(calls, [&] { runDaemon(device.root, "-d"); })) break;
+    ++kills;
+    const std::size_t logsBefore = device.pendingLogs().size();
+    ASSERT_EQ(waitFor(forkProcess([&] { runDaemon(device.root, "-d"); })), 0);
+    SCOPED_TRACE(format("killed before system call %zu", calls));
+    EXPECT_EQ(device.preference(kTavrelDomain, kLastRunDayKey), plist::Value(device.yesterday));
+    EXPECT_EQ(device.preference(kTavrelDomain, kTaskingIDKey), plist::Value("t"));
+    EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
+    const std::size_t logs = device.pendingLogs().size();
+    EXPECT_TRUE(logs == 1 || logs == logsBefore + 1) << logs;
+  }
+  EXPECT_GT(kills, 20U);
+}
+
+}  // namespace
+}  // namespace tavrel
