@@ -64,8 +64,10 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
   // A summary of some of the values would pass for one of all of them.
   if (values.failed()) return;
 
-  if (histogram) {
-    _histogramsOutput.set(forKey, histogramDictForIntervals(intervals, histogram->counts()));
+  if (intervals) {
+    _histogramsOutput.set(forKey, histogram
+                                      ? histogramDictForIntervals(intervals, histogram->counts())
+                                      : plist::Dictionary());
   }
   _distributionsOutput.set(forKey, summary.numbers());
 }

@@ -167,7 +167,7 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
     content->bytes.clear();
   }
 
-  plist::Dictionary merged = content->values;
+  plist::Dictionary merged = plist::mutableCopy(content->values);
   for (const auto& [key, value] : domain.changes)
     merged.set(key, value);
   if (!merged) merged = plist::Dictionary::create();

@@ -12,6 +12,7 @@
 #include <time.h>
 #include <utility>
 
+#include "base/utf8.h"
 #include "platform/linux/stamp.h"
 
 namespace tavrel {
@@ -53,6 +54,27 @@ void appendField(std::string& out, std::string_view name, std::string_view value
   }
   out += value;
   out += '\n';
+}
+
+/// Adds text with its control characters, DEL and malformed bytes as "\xNN": names in messages come
+/// from outside, and a terminal would obey them.
+void appendPrintable(std::string& out, std::string_view text) {
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  while (!text.empty()) {
+    std::string_view rest = text;
+    const char32_t codePoint = takeCodePoint(rest);
+    const std::string_view taken = text.substr(0, text.size() - rest.size());
+    text = rest;
+    const bool malformed = codePoint == kReplacementCharacter && taken.size() == 1;
+    if (codePoint >= 0x20 && (codePoint < 0x7F || codePoint > 0x9F) && !malformed) {
+      out += taken;
+      continue;
+    }
+    for (const char character : taken) {
+      const auto bits = static_cast<unsigned char>(character);
+      out += {'\\', 'x', kDigits[bits >> 4], kDigits[bits & 0xF]};
+    }
+  }
 }
 
 bool writeWhole(int descriptor, std::string_view bytes) {
@@ -154,7 +176,7 @@ void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) con
   }
   while (true) {
     const std::size_t end = message.find('\n');
-    line += message.substr(0, end);
+    appendPrintable(line, message.substr(0, end));
     if (end == std::string_view::npos) break;
     line += continuation;
     message.remove_prefix(end + 1);

@@ -3,7 +3,8 @@
 // Under the service manager standard error is connected to the journal, and JOURNAL_STREAM says to
 // which stream. Entries then go to the journal's own socket, so that an entry of several lines
 // stays one entry and is not mixed with what is printed on standard error. Otherwise each entry is
-// written on standard error at once, as "TIME LEVEL message", further lines indented.
+// written on standard error at once, as "TIME LEVEL message", further lines indented and control
+// characters escaped.
 //
 // Every level is written; what to keep and what to show is the journal's business.
 #pragma once

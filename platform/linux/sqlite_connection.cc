@@ -1,11 +1,18 @@
 #include "platform/linux/sqlite_connection.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <cstring>
+#include <fcntl.h>
 #include <sqlite3.h>
+#include <thread>
+#include <unistd.h>
 #include <utility>
 
 namespace tavrel {
 namespace {
+
+constexpr const char* kFreeSpace = "free some space in its file system";
 
 struct Explanation {
   StoreFault fault;
@@ -29,23 +36,58 @@ Explanation explain(int code) {
     case SQLITE_ERROR:
       return {StoreFault::Foreign, "the tables are not this program's; move the file away"};
     case SQLITE_FULL:
-      return {StoreFault::Other, "free some space in its file system"};
+      return {StoreFault::Device, kFreeSpace};
+    case SQLITE_IOERR:
+      return {StoreFault::Device, "check the file system that holds it"};
     default:
       return {StoreFault::Other, "check the file system that holds it"};
   }
 }
 
+// Why the system does not let the database be written; 0 when it does or when there is none.
+int obstacleToWriting(sqlite3* connection) {
+  const char* const name = sqlite3_db_filename(connection, "main");
+  const std::string path = name ? name : "";
+  if (path.empty()) return 0;
+  const std::string folder = path.substr(0, path.rfind('/') + 1);
+  for (const std::string& place : {path, folder}) {
+    if (!place.empty() && faccessat(AT_FDCWD, place.c_str(), W_OK, AT_EACCESS) != 0) return errno;
+  }
+  return 0;
+}
+
+// The system's code behind a failure, 0 when there is none. SQLite tries again for reading what it
+// may not open for writing, and then tells the code of the second attempt: the first one's is asked
+// for anew.
+int systemCodeOf(sqlite3* connection, int code) {
+  switch (code & 0xFF) {
+    case SQLITE_IOERR:
+      return sqlite3_system_errno(connection);
+    case SQLITE_CANTOPEN:
+      if (const int obstacle = obstacleToWriting(connection)) return obstacle;
+      return sqlite3_system_errno(connection);
+    case SQLITE_READONLY:
+      return obstacleToWriting(connection);
+    default:
+      return 0;
+  }
+}
+
 [[noreturn]] void throwFailure(sqlite3* connection, int code) {
-  const Explanation explanation = explain(code);
+  auto [fault, advice] = explain(code);
   std::string message = connection ? sqlite3_errmsg(connection) : sqlite3_errstr(code);
-  const int systemCode = connection ? sqlite3_system_errno(connection) : 0;
-  const bool fromSystem = (code & 0xFF) == SQLITE_CANTOPEN || (code & 0xFF) == SQLITE_IOERR;
-  if (fromSystem && systemCode != 0) {
+  if (const int systemCode = connection ? systemCodeOf(connection, code) : 0) {
     message += " (";
     message += std::strerror(systemCode);
     message += ')';
+    advice = adviceFor(systemCode, advice);
+    if (advice == kFreeSpace) fault = StoreFault::Device;
   }
-  throw StoreFailure{explanation.fault, message + ": " + explanation.advice};
+  throw StoreFailure{fault, message + ": " + advice};
+}
+
+int waitForLock(void* busy, int) {
+  return static_cast<BusyBudget*>(busy)->wait();
 }
 
 // SQLite's URI form is the only way to ask for an immutable file; in it "%", "?" and "#" have a
@@ -68,7 +110,31 @@ std::string immutableUri(const std::string& path) {
 
 }  // namespace
 
-SqliteConnection::SqliteConnection(const std::string& path, Access access, int busyMilliseconds) {
+const char* adviceFor(int systemCode, const char* otherwise) {
+  switch (systemCode) {
+    case ENOSPC:
+    case EDQUOT:
+      return kFreeSpace;
+    case EROFS:
+      return "mount its file system for writing";
+    default:
+      return otherwise;
+  }
+}
+
+bool BusyBudget::wait() {
+  using Clock = std::chrono::steady_clock;
+  constexpr Clock::duration kMoment = std::chrono::milliseconds(5);
+  if (left_ <= Clock::duration::zero()) return false;
+  const auto begin = Clock::now();
+  std::this_thread::sleep_for(std::min(kMoment, left_));
+  left_ -= Clock::now() - begin;
+  return true;
+}
+
+SqliteConnection::SqliteConnection(const std::string& path, Access access,
+                                   std::shared_ptr<BusyBudget> busy)
+    : busy_(std::move(busy)) {
   int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
   std::string name = path;
   switch (access) {
@@ -88,7 +154,7 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access, int b
   const int code = sqlite3_open_v2(name.c_str(), &handle_, flags, nullptr);
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
-    sqlite3_busy_timeout(handle_, busyMilliseconds);
+    sqlite3_busy_handler(handle_, waitForLock, busy_.get());
     // The file may come from anywhere: nothing that its schema says is to run.
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
@@ -106,10 +172,11 @@ SqliteConnection::~SqliteConnection() {
 }
 
 SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
-    : handle_(std::exchange(other.handle_, nullptr)) {}
+    : handle_(std::exchange(other.handle_, nullptr)), busy_(std::move(other.busy_)) {}
 
 SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
   std::swap(handle_, other.handle_);
+  std::swap(busy_, other.busy_);
   return *this;
 }
 

@@ -9,8 +9,10 @@
 //   while (statement.step()) use(statement.integer(0));
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <exception>
+#include <memory>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -24,7 +26,8 @@ enum class StoreFault : std::uint8_t {
   Damaged,  // SQLite finds the file corrupt or no database at all
   Busy,     // another process held its lock for too long
   Refused,  // the system does not let this user, or anybody, at the file
-  Foreign,  // a database, but of a schema that this program does not know
+  Device,   // the system fails at reading or writing, for a fault or for want of space
+  Foreign,  // something that this program did not make or does not know, and leaves alone
   Other,
 };
 
@@ -37,6 +40,21 @@ struct StoreFailure : std::exception {
   std::string message;
 };
 
+/// What can be done about a failure of the system; `otherwise` when its code tells nothing.
+const char* adviceFor(int systemCode, const char* otherwise);
+
+/// How long locks of other processes are waited for, all waits together.
+class BusyBudget {
+ public:
+  explicit BusyBudget(int milliseconds) : left_(std::chrono::milliseconds(milliseconds)) {}
+
+  /// Waits a moment before a lock is tried again; false when the time is used up.
+  bool wait();
+
+ private:
+  std::chrono::steady_clock::duration left_;
+};
+
 class SqliteConnection {
  public:
   enum class Access : std::uint8_t {
@@ -45,8 +63,7 @@ class SqliteConnection {
     Immutable,  // read a file that nobody writes, without locks and without a log
   };
 
-  /// `busyMilliseconds`: how long a lock of another process is waited for.
-  SqliteConnection(const std::string& path, Access access, int busyMilliseconds);
+  SqliteConnection(const std::string& path, Access access, std::shared_ptr<BusyBudget> busy);
   ~SqliteConnection();
   SqliteConnection(SqliteConnection&& other) noexcept;
   SqliteConnection& operator=(SqliteConnection&& other) noexcept;
@@ -65,6 +82,7 @@ class SqliteConnection {
 
  private:
   sqlite3* handle_ = nullptr;
+  std::shared_ptr<BusyBudget> busy_;
 };
 
 class SqliteStatement {

@@ -6,6 +6,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/text.h"
 #include "platform/linux/sqlite_chunk.h"
 
 namespace tavrel {
@@ -21,10 +22,20 @@ std::optional<std::string> keyAbove(std::string_view prefix) {
   return above;
 }
 
+StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
+  // Of a long key its beginning says enough.
+  constexpr std::size_t kShownBytes = 200;
+  std::string message = "distribution ";
+  appendQuoted(message, key.substr(0, kShownBytes));
+  message += " of day " + std::to_string(day) + ": " + failure.message;
+  return {failure.fault, std::move(message)};
+}
+
 class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  public:
-  ChunkEnumerator(SqliteStatement& chunks, std::vector<Sample>& samples, std::int64_t series)
-      : chunks_(chunks), samples_(samples), series_(series) {}
+  ChunkEnumerator(SqliteStatement& chunks, std::vector<Sample>& samples, std::int64_t series,
+                  std::int64_t count)
+      : chunks_(chunks), samples_(samples), series_(series), count_(count) {}
   ~ChunkEnumerator() override {
     if (state_ == State::Reading) chunks_.reset();
   }
@@ -40,26 +51,34 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
     try {
       if (state_ == State::Unread) begin();
       if (state_ == State::Reading && chunks_.step()) {
-        if (decodeChunk(chunks_.bytes(0), samples_)) return samples_;
-        throw StoreFailure{StoreFault::Other,
-                           "the values of a distribution are not in the form that this program "
-                           "writes: restore the file from a copy or move it away"};
+        if (!decodeChunk(chunks_.bytes(0), samples_)) {
+          refuse("its values are not in the form that this program writes");
+        }
+        read_ += static_cast<std::int64_t>(samples_.size());
+        if (read_ <= count_) return samples_;
+      }
+      if (state_ == State::Reading && read_ != count_) {
+        refuse("it does not hold the " + std::to_string(count_) + " values that it counts");
       }
     } catch (const StoreFailure& failure) {
       failure_ = failure;
+      fail();
     }
     if (state_ == State::Reading) chunks_.reset();
     state_ = State::Ended;
     return {};
   }
 
+  [[noreturn]] static void refuse(const std::string& reason) {
+    throw StoreFailure{StoreFault::Other,
+                       reason + ": restore the file from a copy or move it away"};
+  }
+
   void begin() {
     constexpr std::int64_t kSeriesEnd = std::int64_t{1} << (62 - kChunkOrdinalBits);
     if (series_ < 0 || series_ >= kSeriesEnd) {
       state_ = State::Ended;
-      throw StoreFailure{StoreFault::Other,
-                         "a distribution refers to values that cannot exist: restore the file "
-                         "from a copy or move it away"};
+      refuse("it refers to values that cannot exist");
     }
     chunks_.bind(1, series_ << kChunkOrdinalBits);
     chunks_.bind(2, (series_ + 1) << kChunkOrdinalBits);
@@ -69,6 +88,8 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
   SqliteStatement& chunks_;
   std::vector<Sample>& samples_;
   std::int64_t series_;
+  std::int64_t count_;
+  std::int64_t read_ = 0;
   State state_ = State::Unread;
   std::optional<StoreFailure> failure_;
 };
@@ -133,10 +154,12 @@ void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                                               std::int64_t maxDaysSince1970,
                                               const DistributionRowHandler& rowHandler) {
   try {
-    readDistributions(Selection::between(prefix, minDaysSince1970, maxDaysSince1970),
-                      [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
-                                    BHHistoryDistributionEnumerator& values,
-                                    bool& stop) { rowHandler(key, day, values, stop); });
+    readDistributions(
+        Selection::between(prefix, minDaysSince1970, maxDaysSince1970),
+        [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
+                      BHHistoryDistributionEnumerator& values,
+                      bool& stop) { rowHandler(key, day, values, stop); },
+        [this](const StoreFailure& failure) { site_.tell(failure); });
   } catch (const StoreFailure& failure) {
     report(failure);
   }
@@ -154,12 +177,23 @@ Status SqliteHistory::walkScalars(std::string_view prefix, std::int32_t firstDay
 
 Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t firstDay,
                                         std::int32_t lastDay, const CountedRowHandler& rowHandler) {
+  std::optional<StoreFailure> first;
+  std::int64_t others = 0;
   try {
-    readDistributions({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler);
+    readDistributions({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler,
+                      [&](const StoreFailure& failure) {
+                        if (first) return void(++others);
+                        first = failure;
+                      });
   } catch (const StoreFailure& failure) {
     return Error{site_.describe(failure)};
   }
-  return Done{};
+  if (!first) return Done{};
+  std::string message = site_.describe(*first);
+  if (others > 0) {
+    message += "; " + std::to_string(others) + " more could not be read whole";
+  }
+  return Error{std::move(message)};
 }
 
 Expected<SqliteHistory::Holdings> SqliteHistory::holdings() {
@@ -208,7 +242,8 @@ void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandl
 }
 
 void SqliteHistory::readDistributions(const Selection& selection,
-                                      const CountedRowHandler& rowHandler) {
+                                      const CountedRowHandler& rowHandler,
+                                      const FailureHandler& tell) {
   if (!store_ || selection.isEmpty()) return;
   SqliteStatement rows(store_->connection, selection.choose(store_sql::kDistributionsOfDay,
                                                             store_sql::kDistributionsByKey,
@@ -220,9 +255,13 @@ void SqliteHistory::readDistributions(const Selection& selection,
   while (!stop && rows.step()) {
     const std::string_view key = rows.bytes(0);
     if (!key.starts_with(selection.prefix)) break;
-    ChunkEnumerator values(chunks, samples, rows.integer(2));
-    rowHandler(key, static_cast<std::int32_t>(rows.integer(1)), rows.integer(3), values, stop);
-    if (values.failure()) throw *values.failure();
+    const auto day = static_cast<std::int32_t>(rows.integer(1));
+    const std::int64_t count = rows.integer(3);
+    ChunkEnumerator values(chunks, samples, rows.integer(2), count);
+    rowHandler(key, day, count, values, stop);
+    if (!values.failure()) continue;
+    if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();
+    tell(inDistribution(key, day, *values.failure()));
   }
 }
 
@@ -232,7 +271,7 @@ void SqliteHistory::report(const StoreFailure& failure) {
     store_.reset();
     untold = site_.setAside(identity_, failure);
   }
-  if (untold) site_.log.write(LogLevel::Error, site_.describe(*untold));
+  if (untold) site_.tell(*untold);
 }
 
 }  // namespace tavrel

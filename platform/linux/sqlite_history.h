@@ -42,7 +42,8 @@ class SqliteHistory : public BHHistory {
                          BHHistoryDistributionEnumerator& values, bool& stop)>;
 
   /// Rows whose key begins with `prefix`, from `firstDay` to `lastDay`, both included, ordered by
-  /// day and then by key. On failure the rows before it have been delivered.
+  /// day and then by key. On failure the rows before it have been delivered. A distribution whose
+  /// values could not all be read fails the walk at its end, after the rows behind it.
   Status walkScalars(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                      const ScalarRowHandler& rowHandler);
   Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
@@ -61,7 +62,10 @@ class SqliteHistory : public BHHistory {
   enum class Order : std::uint8_t { KeyThenDay, DayThenKey };
   struct Selection;
   void readScalars(const Selection& selection, const ScalarRowHandler& rowHandler);
-  void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler);
+  /// Damage that SQLite finds ends the walk; of other rows with missing values `tell` is told.
+  using FailureHandler = std::function<void(const StoreFailure& failure)>;
+  void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
+                         const FailureHandler& tell);
   void report(const StoreFailure& failure);
 
   StoreSite site_;

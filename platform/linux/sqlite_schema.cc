@@ -62,7 +62,7 @@ bool checkIsFile(const std::string& path) {
                                                 ": check owner and permissions of its folder"};
   }
   if (!S_ISREG(status.st_mode)) {
-    throw StoreFailure{StoreFault::Refused, "is not a regular file: move it away"};
+    throw StoreFailure{StoreFault::Foreign, "is not a regular file: move it away"};
   }
   return true;
 }
@@ -82,12 +82,13 @@ bool isReadable(SqliteConnection& connection) {
 
 }  // namespace
 
-SqliteConnection openStoreForWriting(const std::string& path, int busyMilliseconds) {
+SqliteConnection openStoreForWriting(const std::string& path,
+                                     const std::shared_ptr<BusyBudget>& busy) {
   checkIsFile(path);
-  SqliteConnection connection(path, SqliteConnection::Access::Create, busyMilliseconds);
+  SqliteConnection connection(path, SqliteConnection::Access::Create, busy);
   std::int64_t version = schemaVersion(connection);
   if (version == 0) {
-    const StoreFolderLock lock(path, busyMilliseconds);
+    const StoreFolderLock lock(path, *busy);
     version = schemaVersion(connection);
     if (version == 0) {
       if (hasTables(connection)) refuseSchema(version);
@@ -104,15 +105,18 @@ SqliteConnection openStoreForWriting(const std::string& path, int busyMillisecon
   return connection;
 }
 
-std::optional<ReadableStore> openStoreForReading(const std::string& path, int busyMilliseconds) {
+std::optional<ReadableStore> openStoreForReading(const std::string& path,
+                                                 const std::shared_ptr<BusyBudget>& busy) {
   if (!checkIsFile(path)) return std::nullopt;
   try {
-    SqliteConnection connection(path, SqliteConnection::Access::Read, busyMilliseconds);
+    SqliteConnection connection(path, SqliteConnection::Access::Read, busy);
     if (!isReadable(connection)) return std::nullopt;
     return ReadableStore{std::move(connection), false};
   } catch (const StoreFailure& failure) {
-    if (failure.fault != StoreFault::Refused) throw;
+    // Taking part in the log needs files of its own beside the store, and room for them.
+    if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
     if (hasLog(path)) {
+      if (failure.fault == StoreFault::Device) throw;
       throw StoreFailure{failure.fault,
                          failure.message +
                              "; its write-ahead log is only readable where the folder can be "
@@ -120,7 +124,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path, int bu
     }
   }
   // Without a log nobody is writing, and all there is stands in the file itself.
-  SqliteConnection connection(path, SqliteConnection::Access::Immutable, busyMilliseconds);
+  SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
   if (!isReadable(connection)) return std::nullopt;
   return ReadableStore{std::move(connection), true};
 }

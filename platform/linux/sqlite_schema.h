@@ -2,6 +2,7 @@
 // the tables for those who read the file with other tools.
 #pragma once
 
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -44,15 +45,17 @@ inline constexpr std::string_view kChunks =
 inline constexpr int kChunkOrdinalBits = 20;
 
 /// Opens the store for writing and gives an empty file the schema. The folder must exist.
-SqliteConnection openStoreForWriting(const std::string& path, int busyMilliseconds);
+SqliteConnection openStoreForWriting(const std::string& path,
+                                     const std::shared_ptr<BusyBudget>& busy);
 
 struct ReadableStore {
   SqliteConnection connection;
-  /// Opened without locks because the folder does not let a log be taken part in.
+  /// Opened without locks because a log could not be taken part in.
   bool immutable;
 };
 
 /// Opens the store for reading; nothing when there is none yet.
-std::optional<ReadableStore> openStoreForReading(const std::string& path, int busyMilliseconds);
+std::optional<ReadableStore> openStoreForReading(const std::string& path,
+                                                 const std::shared_ptr<BusyBudget>& busy);
 
 }  // namespace tavrel

@@ -1,14 +1,12 @@
 #include "platform/linux/sqlite_site.h"
 
 #include <cerrno>
-#include <chrono>
 #include <cmath>
 #include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
-#include <thread>
 #include <unistd.h>
 
 #include "base/civil_time.h"
@@ -56,7 +54,7 @@ std::optional<FileIdentity> FileIdentity::of(const std::string& path) {
   return FileIdentity{status.st_dev, status.st_ino};
 }
 
-StoreFolderLock::StoreFolderLock(const std::string& storePath, int busyMilliseconds) {
+StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy) {
   const std::string folder = folderOf(storePath);
   descriptor_ = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
   if (descriptor_ < 0) {
@@ -64,17 +62,14 @@ StoreFolderLock::StoreFolderLock(const std::string& storePath, int busyMilliseco
                                                 std::strerror(errno) +
                                                 ": check owner and permissions of the folder"};
   }
-  using Steady = std::chrono::steady_clock;
-  const auto deadline = Steady::now() + std::chrono::milliseconds(busyMilliseconds);
   while (flock(descriptor_, LOCK_EX | LOCK_NB) != 0) {
     const int code = errno;
-    if ((code != EWOULDBLOCK && code != EINTR) || Steady::now() >= deadline) {
+    if ((code != EWOULDBLOCK && code != EINTR) || !busy.wait()) {
       close(descriptor_);
       throw StoreFailure{StoreFault::Busy,
                          std::string("its folder cannot be locked: ") + std::strerror(code) +
                              ": try again when the process that holds it has finished"};
     }
-    std::this_thread::sleep_for(std::chrono::milliseconds(5));
   }
 }
 
@@ -86,13 +81,19 @@ std::string StoreSite::describe(const StoreFailure& failure) const {
   return "statistics store " + path + ": " + failure.message;
 }
 
+void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) const {
+  const bool lasts = failure.fault == StoreFault::Foreign || failure.fault == StoreFault::Damaged;
+  if (lasts && !told->insert(failure.message).second) return;
+  log.write(LogLevel::Error, describe(failure).append(consequence));
+}
+
 std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
                                                 const StoreFailure& failure) const {
   if (leavesDamaged) {
     return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
   }
   try {
-    const StoreFolderLock lock(path, busyMilliseconds);
+    const StoreFolderLock lock(path, *busy);
     if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
     const std::string name = freeName(path + ".corrupt-" + stampOf(clock.now()));
     // The log goes first: were the process killed in between, the file would be found damaged once

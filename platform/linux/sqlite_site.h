@@ -1,11 +1,14 @@
 // Where the statistics store lies, and what is done when its file turns out to be unusable.
 #pragma once
 
+#include <cstdint>
+#include <memory>
 #include <optional>
+#include <set>
 #include <string>
+#include <string_view>
 
 #include "base/expected.h"
-#include "base/limits.h"
 #include "platform/clock.h"
 #include "platform/linux/sqlite_connection.h"
 #include "platform/preferences.h"
@@ -28,7 +31,7 @@ struct FileIdentity {
 class StoreFolderLock {
  public:
   /// Throws `StoreFailure` when the lock is not to be had in time.
-  StoreFolderLock(const std::string& storePath, int busyMilliseconds);
+  StoreFolderLock(const std::string& storePath, BusyBudget& busy);
   ~StoreFolderLock();
   StoreFolderLock(const StoreFolderLock&) = delete;
   StoreFolderLock& operator=(const StoreFolderLock&) = delete;
@@ -40,15 +43,20 @@ class StoreFolderLock {
 /// The store's path and the services that its failures are told to. The services must outlive it.
 struct StoreSite {
   std::string path;
-  int busyMilliseconds;
+  std::shared_ptr<BusyBudget> busy;
   Clock& clock;
   Preferences& preferences;
   SystemLog& log;
   /// A damaged store stays where it is: for readers that change nothing.
   bool leavesDamaged = false;
+  /// Failures that only somebody's intervention ends: they are told once.
+  std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
 
   /// "statistics store PATH: MESSAGE".
   std::string describe(const StoreFailure& failure) const;
+
+  /// One line in the system log, with `consequence` at its end.
+  void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
 
   /// Moves a damaged store with its log files to names of their own, counts it and says so.
   /// `damaged` is the file that was found damaged: nothing is done when another process has

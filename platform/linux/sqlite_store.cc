@@ -16,7 +16,12 @@ namespace tavrel {
 
 SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences,
                          SystemLog& log, int busyMilliseconds, bool leavesDamaged)
-    : site_{root.path(kStorePath), busyMilliseconds, clock, preferences, log, leavesDamaged} {}
+    : site_{root.path(kStorePath),
+            std::make_shared<BusyBudget>(busyMilliseconds),
+            clock,
+            preferences,
+            log,
+            leavesDamaged} {}
 
 SqliteStore::~SqliteStore() {
   endGuarded(site_.log, "commit the last statistics", [this] { commit(); });
@@ -49,11 +54,12 @@ SqliteConnection SqliteStore::openForWriting() {
   std::error_code code;
   std::filesystem::create_directories(folder, code);
   if (code) {
-    throw StoreFailure{StoreFault::Refused, "its folder cannot be made: " + code.message() +
-                                                ": check owner and permissions of " +
-                                                folder.parent_path().string()};
+    const std::string checkOwner =
+        "check owner and permissions of " + folder.parent_path().string();
+    throw StoreFailure{StoreFault::Refused, "its folder cannot be made: " + code.message() + ": " +
+                                                adviceFor(code.value(), checkOwner.c_str())};
   }
-  return openStoreForWriting(site_.path, site_.busyMilliseconds);
+  return openStoreForWriting(site_.path, site_.busy);
 }
 
 template <class Operation>
@@ -79,9 +85,8 @@ bool SqliteStore::commit() {
     batch.finish();
   });
   if (failure) {
-    site_.log.write(LogLevel::Error, site_.describe(*failure) + "; " +
-                                         std::to_string(pending_.size()) +
-                                         " values wait for the next commit");
+    site_.tell(*failure,
+               "; " + std::to_string(pending_.size()) + " values wait for the next commit");
     return false;
   }
   pending_.clear();
@@ -103,20 +108,20 @@ void SqliteStore::BHClientCheckpoint() {
                                       "need stays there until the next checkpoint"}));
     }
   });
-  if (failure) site_.log.write(LogLevel::Error, site_.describe(*failure));
+  if (failure) site_.tell(*failure);
 }
 
 std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
     const std::optional<FileIdentity>& identity) {
   return std::make_unique<SqliteHistory>(site_, identity,
-                                         openStoreForReading(site_.path, site_.busyMilliseconds));
+                                         openStoreForReading(site_.path, site_.busy));
 }
 
 std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
   std::unique_ptr<SqliteHistory> history;
   const auto failure = attempt([&](const auto& identity) { history = openForReading(identity); });
   if (failure) {
-    site_.log.write(LogLevel::Error, site_.describe(*failure));
+    site_.tell(*failure);
     history = std::make_unique<SqliteHistory>(site_, std::nullopt, std::nullopt);
   } else if (!history->hasStore()) {
     site_.log.write(LogLevel::Info,

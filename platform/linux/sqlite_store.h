@@ -39,7 +39,8 @@ inline constexpr std::string_view kStorePath = "/var/mobile/Library/Brimhold/BHD
 class SqliteStore : public StatisticsStore {
  public:
   /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited
-  /// for. `leavesDamaged`: a damaged store is reported and not set aside.
+  /// for, in all operations together. `leavesDamaged`: a damaged store is reported and not set
+  /// aside.
   SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences, SystemLog& log,
               int busyMilliseconds = limits::kStoreBusyMilliseconds, bool leavesDamaged = false);
   ~SqliteStore() override;

@@ -267,16 +267,16 @@ TEST_F(ServiceTest, PeersWaitWhileThereIsNoDescriptor) {
 }
 
 TEST_F(ServiceTest, ASocketThatFailsForGoodIsToldOnceAndLeft) {
-  auto socket = ServiceSocket::open(*root, kName);
-  ASSERT_TRUE(socket);
-  const int descriptor = socket->get();
-  SocketListener broken("name", *std::move(socket), loop, log);
+  int ends[2];
+  ASSERT_EQ(pipe(ends), 0);
+  const Descriptor writing(ends[1]);
+  ASSERT_EQ(write(writing.get(), "x", 1), 1);
+  SocketListener broken("name", ServiceSocket(Descriptor(ends[0])), loop, log);
   broken.resume();
-  ASSERT_EQ(shutdown(descriptor, SHUT_RDWR), 0);
   EXPECT_EQ(drain(), 0);
   EXPECT_EQ(log.lines,
-            std::vector<std::string>{
-                "name: no further peers are taken: Invalid argument; restart the service"});
+            std::vector<std::string>{"name: no further peers are taken: Socket operation "
+                                     "on non-socket; restart the service"});
 }
 
 TEST_F(ServiceTest, SilentPeersStopCountingAsEvents) {
@@ -433,7 +433,7 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
     waitpid(child, nullptr, 0);
 
   // A damaged counter holds nobody up.
-  for (const std::string damaged : {std::string(), std::string("-1\n"), std::string(99, '1')}) {
+  for (const char* const damaged : {"", "-1\n", "1111111111222222222233333333334444\n"}) {
     device.write("/run/tavrel/notifications/" + std::string(kNotification), damaged);
     log.lines.clear();
     notifications.post(kNotification);

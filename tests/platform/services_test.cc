@@ -71,6 +71,14 @@ TEST(DeviceAnswers, ComeFromTheFileAndTheFileSystem) {
   recorded.SQCopyAnswer("DiskUsage").dictionary().set("x", 1);
   EXPECT_EQ(textOf(recorded.SQCopyAnswer("DiskUsage")), "{}") << "each answer is the caller's own";
   EXPECT_TRUE(device.log.lines.empty());
+
+  device.write("/etc/tavrel/device-answers.plist", "<plist version=\"1.0\"><array/></plist>");
+  FileDeviceAnswers unusable(device.root, device.files, device.propertyLists, device.log);
+  EXPECT_TRUE(unusable.SQCopyAnswer("a").isNull() && unusable.SQCopyAnswer("b").isNull());
+  EXPECT_EQ(device.log.lines,
+            std::vector<std::string>{"cannot read " +
+                                     device.root.path("/etc/tavrel/device-answers.plist") +
+                                     ": it holds no dictionary; mend or remove it"});
 }
 
 TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
@@ -100,17 +108,6 @@ TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
   device.version.systemVersionDictionary().set("ProductName", "changed");
   EXPECT_EQ(device.version.text(), "Pellio (16R349)");
   EXPECT_EQ(device.version.systemVersionDictionary().size(), 2U) << "only texts";
-}
-
-TEST(Facts, AFileThatCannotServeIsToldOnceAndLeftOut) {
-  Services device;
-  device.write("/etc/tavrel/device-answers.plist", "<plist version=\"1.0\"><array/></plist>");
-  EXPECT_TRUE(device.answers.SQCopyAnswer("a").isNull());
-  EXPECT_TRUE(device.answers.SQCopyAnswer("b").isNull());
-  EXPECT_EQ(device.log.lines,
-            std::vector<std::string>{"cannot read " +
-                                     device.root.path("/etc/tavrel/device-answers.plist") +
-                                     ": it holds no dictionary; mend or remove it"});
 }
 
 TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {
@@ -200,11 +197,14 @@ TEST(SystemLog, WritesLinesOnAStream) {
   LinuxSystemLog log(writing.get());
   log.write(LogLevel::Default, "tavrel started");
   log.write(LogLevel::Error, "one\ntwo\n");
+  log.write(LogLevel::Info, "k\x1B[2J\t\x7F\xC2\x9B\x9B\xC3\xA9\xEF\xBF\xBD\xE2\x82");
   std::string text(1000, '\0');
   text.resize(static_cast<std::size_t>(read(reading.get(), text.data(), text.size())));
   const std::string time = R"(\d{4}-\d\d-\d\dT\d\d:\d\d:\d\d\.\d{3}Z)";
   EXPECT_TRUE(std::regex_match(
-      text, std::regex(time + " default tavrel started\n" + time + " error one\n  two\n  \n")))
+      text, std::regex(time + " default tavrel started\n" + time + " error one\n  two\n  \n" +
+                       time + R"( info k\\x1B\[2J\\x09\\x7F\\xC2\\x9B\\x9B)" +
+                       "\xC3\xA9\xEF\xBF\xBD" + R"(\\xE2\\x82)" + "\n")))
       << text;
 }
 

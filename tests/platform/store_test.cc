@@ -3,12 +3,14 @@
 #include <csignal>
 #include <filesystem>
 #include <gtest/gtest.h>
+#include <iostream>
 #include <iterator>
 #include <limits>
 #include <map>
 #include <memory>
 #include <sqlite3.h>
 #include <string>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -17,6 +19,7 @@
 #include "faulty_file_layer.h"
 #include "fixed_clock.h"
 #include "platform/linux/file_preferences.h"
+#include "platform/linux/sqlite_schema.h"
 #include "platform/linux/sqlite_store.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
@@ -58,7 +61,7 @@ class StoreTest : public testing::Test {
         });
     return rows;
   }
-  std::string read(const std::string& path) { return *files_.read(path, 1U << 24); }
+  std::string contentOf(const std::string& path) { return *files_.read(path, 1U << 24); }
   Rows scalarsOfToday() { return scalars(*store_->initWithDefaultPath(), "", kToday - 1, kToday); }
 
   static std::vector<Sample> take(BHHistoryDistributionEnumerator& values) {
@@ -242,39 +245,72 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
   EXPECT_EQ(keys, (std::vector<std::string>{"d.one", "d.two"}));
 }
 
-TEST_F(StoreTest, ReadsOnlyTheValuesThatAreAskedFor) {
+TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   auto batch = store_->beginBatch();
-  ASSERT_TRUE((*batch)->appendValue(kToday, "bad", 1, 1));
+  ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 1, 1));
   ASSERT_TRUE((*batch)->appendValue(kToday, "good", 2, 2));
   ASSERT_TRUE((*batch)->commit());
   batch->reset();
-  sql("UPDATE chunks SET data = x'00' WHERE chunk = 0");
-
-  const auto history = store_->openHistory();
-  std::vector<std::string> seen;
-  const auto walk = [&](bool readsBad) {
-    seen.clear();
-    return (*history)->walkDistributions(
-        "", kFirstDay, kLastDay,
-        [&](std::string_view key, std::int32_t, std::int64_t count,
-            BHHistoryDistributionEnumerator& values, bool&) {
-          EXPECT_EQ(count, 1);
-          if (key == "good" || readsBad) {
-            seen.push_back(std::string(key) + ":" + std::to_string(take(values).size()));
-          }
-        });
+  const std::string whole = contentOf(store_->path());
+  const std::string ofBad = " WHERE key = CAST('bad' || char(10) AS BLOB)";
+  const struct {
+    std::string change, reason;
+    bool readsSome = false;
+  } cases[] = {
+      {"UPDATE chunks SET data = x'00' WHERE chunk = 0",
+       "its values are not in the form that this program writes"},
+      {"DELETE FROM chunks WHERE chunk = 0", "it does not hold the 1 values that it counts"},
+      {"UPDATE distributions SET count = 2" + ofBad, "it does not hold the 2 values that it counts",
+       true},
+      {"UPDATE distributions SET count = 0" + ofBad,
+       "it does not hold the 0 values that it counts"},
+      {"DELETE FROM chunks WHERE chunk = 0; UPDATE distributions SET count = -1" + ofBad,
+       "it does not hold the -1 values that it counts"},
+      {"UPDATE distributions SET series = -1" + ofBad, "it refers to values that cannot exist"},
   };
-  EXPECT_TRUE(walk(false));
-  EXPECT_EQ(seen, (std::vector<std::string>{"good:1"}));
-  EXPECT_EQ(walk(true).error().message,
-            "statistics store " + store_->path() +
-                ": the values of a distribution are not in the form that this program writes: "
-                "restore the file from a copy or move it away");
-
+  for (const auto& item : cases) {
+    SCOPED_TRACE(item.change);
+    root_.write(kStorePath, whole);
+    sql(item.change);
+    log_.lines.clear();
+    const auto history = store_->openHistory();
+    std::vector<std::string> seen;
+    const auto see = [&](std::string_view key, BHHistoryDistributionEnumerator& values) {
+      const auto size = take(values).size();
+      seen.push_back(std::string(key) + std::to_string(size) + (values.failed() ? " failed" : ""));
+    };
+    const auto walk = [&](std::string_view unread) {
+      return (*history)->walkDistributions("", kFirstDay, kLastDay,
+                                           [&](std::string_view key, std::int32_t, std::int64_t,
+                                               BHHistoryDistributionEnumerator& values, bool&) {
+                                             if (key != unread) see(key, values);
+                                           });
+    };
+    EXPECT_TRUE(walk("bad\n"));
+    const std::string line = "statistics store " + store_->path() +
+                             ": distribution \"bad\\n\" of day " + std::to_string(kToday) + ": " +
+                             item.reason + ": restore the file from a copy or move it away";
+    EXPECT_EQ(walk("").error().message, line);
+    (*history)->distributionsForKeyPrefix(
+        "", kToday - 1, kToday,
+        [&](std::string_view key, std::int32_t, BHHistoryDistributionEnumerator& values, bool&) {
+          see(key, values);
+        });
+    const std::string bad = item.readsSome ? "bad\n1 failed" : "bad\n0 failed";
+    EXPECT_EQ(seen, (std::vector<std::string>{"good1", bad, "good1", bad, "good1"}));
+    EXPECT_EQ(log_.lines, std::vector<std::string>{line});
+  }
   // A writer does not build on it either.
   batch = store_->beginBatch();
-  ASSERT_TRUE((*batch)->appendValue(kToday, "bad", 3, 3));
+  ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 3, 3));
   EXPECT_FALSE((*batch)->commit());
+  batch->reset();
+  sql("DELETE FROM chunks");
+  EXPECT_TRUE((*store_->openHistory())
+                  ->walkDistributions("", kFirstDay, kLastDay,
+                                      [&](auto, auto, auto, auto& values, auto&) { take(values); })
+                  .error()
+                  .message.ends_with("; 1 more could not be read whole"));
   EXPECT_EQ(corruptions(), 0);
 }
 
@@ -344,6 +380,18 @@ TEST_F(StoreTest, ValuesOutlastALock) {
   writer->reset();
   EXPECT_TRUE(impatient->commit());
   EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 3}}));
+
+  // The time for waiting is spent once, whatever is waited for.
+  const auto budget = std::make_shared<BusyBudget>(20);
+  const auto another = std::make_shared<BusyBudget>(20);
+  const StoreFolderLock held(store_->path(), *another);
+  EXPECT_THROW(StoreFolderLock(store_->path(), *budget), StoreFailure);
+  EXPECT_FALSE(budget->wait());
+  SqliteConnection first = openStoreForWriting(store_->path(), another);
+  SqliteConnection second = openStoreForWriting(store_->path(), another);
+  first.execute("BEGIN IMMEDIATE");
+  EXPECT_THROW(second.execute("BEGIN IMMEDIATE"), StoreFailure);
+  EXPECT_FALSE(another->wait());
 }
 
 TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
@@ -351,12 +399,12 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   for (int i = 0; i < 500; ++i)
     store_->BHClientSetValueForScalarKey("k" + std::to_string(i), i);
   store_->BHClientCheckpoint();
-  const std::string good = read(store_->path());
+  const std::string good = contentOf(store_->path());
   sql("CREATE TABLE more (x); PRAGMA user_version = 2");
-  const std::string later = read(store_->path());
+  const std::string later = contentOf(store_->path());
   std::filesystem::remove(store_->path());
   sql("CREATE TABLE theirs (x)");
-  const std::string foreign = read(store_->path());
+  const std::string foreign = contentOf(store_->path());
 
   std::string flipped = good;
   for (std::size_t i = 4096; i < flipped.size(); i += 7)
@@ -383,6 +431,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   for (const auto& item : cases) {
     for (const bool byReader : {true, false}) {
       SCOPED_TRACE(std::string(item.name) + (byReader ? ", read" : ", written"));
+      store_ = open();
       for (const auto& file : setAsideFiles())
         std::filesystem::remove(file);
       for (const char* suffix : {"", "-wal", "-shm"})
@@ -404,14 +453,19 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
         EXPECT_EQ(log_.lines[0], where + item.reason +
                                      ": the file has to be set aside; it is now " + aside +
                                      " and a new store is begun: inspect or remove that file");
-        EXPECT_EQ(read(aside), item.content);
+        EXPECT_EQ(contentOf(aside), item.content);
         EXPECT_EQ(corruptions(), 1);
       } else {
         EXPECT_EQ(setAsideFiles(), std::vector<std::string>{});
         EXPECT_EQ(corruptions(), 0);
         if (item.reason) {
-          EXPECT_EQ(log_.lines[0].substr(0, (where + item.reason).size()), where + item.reason);
-          EXPECT_EQ(read(store_->path()), item.content);
+          scalarsOfToday();
+          store_->BHClientCheckpoint();
+          EXPECT_EQ(
+              log_.lines,
+              (std::vector<std::string>{where + item.reason +
+                                        (byReader ? "" : "; 1 values wait for the next commit")}));
+          EXPECT_EQ(contentOf(store_->path()), item.content);
         }
       }
       const bool kept = !item.reason || item.damaged;
@@ -426,7 +480,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   EXPECT_EQ(scalarsOfToday(), (Rows{{"new", kToday, 1}}));
 
   // Who finds the damage second does not set the new store aside.
-  const StoreSite site{store_->path(), 1, clock_, preferences_, log_};
+  const StoreSite site{store_->path(), std::make_shared<BusyBudget>(1), clock_, preferences_, log_};
   EXPECT_FALSE(site.setAside(FileIdentity{1, 1}, {StoreFault::Damaged, "damaged"}));
   EXPECT_EQ(scalarsOfToday().size(), 1U);
 
@@ -434,33 +488,36 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
     std::filesystem::remove(store_->path());
     ASSERT_EQ(pipe ? mkfifo(store_->path().c_str(), 0600) : mkdir(store_->path().c_str(), 0700), 0);
     log_.lines.clear();
+    store_ = open();
     EXPECT_EQ(scalarsOfToday(), Rows{});
+    store_->BHClientSetValueForScalarKey("k", 1);
+    EXPECT_FALSE(store_->commit());
     EXPECT_EQ(log_.lines, (std::vector<std::string>{"statistics store " + store_->path() +
                                                     ": is not a regular file: move it away"}));
   }
 }
 
-TEST_F(StoreTest, AUserWhoMayOnlyReadReads) {
+TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   set({{"k", kToday, 1}});
   const std::string folder = std::filesystem::path(store_->path()).parent_path();
   const std::string rootFolder = root_.root.path("");
   ASSERT_EQ(chmod(rootFolder.c_str(), 0755), 0);
-  // Runs as a user who owns nothing here, and yields what that user saw.
-  const auto asAnother = [&](auto action) {
-    int ends[2];
-    EXPECT_EQ(pipe(ends), 0);
-    const pid_t child = fork();
-    if (child == 0) {
-      if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
-      const std::string text = action();
-      _exit(write(ends[1], text.data(), text.size()) < 0);
-    }
-    close(ends[1]);
-    char text[1024];
-    const ssize_t size = read(ends[0], text, sizeof text);
-    close(ends[0]);
-    waitpid(child, nullptr, 0);
-    return std::string(text, size > 0 ? static_cast<std::size_t>(size) : 0);
+  // Compares what a process sees that is restricted in some way.
+  const auto restricted = [](const auto& restriction, const std::string& expected,
+                             const auto& action) {
+    EXPECT_EQ(inChild([&] {
+                if (!restriction()) return 2;
+                const std::string seen = action();
+                if (seen != expected) std::cerr << "seen: " << seen << '\n';
+                return seen == expected ? 0 : 1;
+              }),
+              0)
+        << expected;
+  };
+  // A user who owns nothing here.
+  const auto asAnother = [&](const std::string& expected, const auto& action) {
+    restricted([] { return geteuid() != 0 || setresuid(65534, 65534, 65534) == 0; }, expected,
+               action);
   };
   const auto readAll = [&] {
     std::string text;
@@ -470,31 +527,47 @@ TEST_F(StoreTest, AUserWhoMayOnlyReadReads) {
       text += line + "\n";
     return text;
   };
+  const auto writeAndTell = [&] {
+    store_->BHClientSetValueForScalarKey("k", 3);
+    store_->commit();
+    return log_.lines.empty() ? "" : log_.lines.back();
+  };
+  const std::string where = "statistics store " + store_->path() + ": ";
+  const std::string advice =
+      " (Permission denied): check owner and permissions of the file and its folder";
+  const std::string waits = "; 1 values wait for the next commit";
+  // There is no room for a single byte more.
+  const auto full = [] {
+    const rlimit none{0, 0};
+    return signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &none) == 0;
+  };
+  restricted(full, "k=1;", readAll);
+  restricted(full,
+             where + "disk I/O error (File too large): check the file system that holds it" + waits,
+             writeAndTell);
   ASSERT_EQ(chmod(store_->path().c_str(), 0444), 0);
   ASSERT_EQ(chmod(folder.c_str(), 0555), 0);
-  EXPECT_EQ(asAnother(readAll), "k=1;");
+  asAnother("k=1;", readAll);
+  asAnother(where + "attempt to write a readonly database" + advice + waits, writeAndTell);
+  const std::string log = store_->path() + "-wal";
+  root_.write(std::string(kStorePath) + "-wal", "left behind");
+  asAnother(where + "unable to open database file" + advice +
+                "; its write-ahead log is only readable where the folder can be written: have a "
+                "user who may write run 'tavrelctl stat list' once\n",
+            readAll);
 
   // While a writer has the log open, its index is there to be read with it.
   ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
   ASSERT_EQ(chmod(store_->path().c_str(), 0644), 0);
+  std::filesystem::remove(log);
   {
     const auto reader = store_->initWithDefaultPath();
     EXPECT_EQ(scalars(*reader, "", kToday - 1, kToday).size(), 1U);
     set({{"k", kToday, 2}});
-    EXPECT_EQ(asAnother(readAll), "k=2;");
+    asAnother("k=2;", readAll);
   }
-  EXPECT_EQ(asAnother([&] {
-              store_->BHClientSetValueForScalarKey("k", 3);
-              store_->commit();
-              return log_.lines.empty() ? "" : log_.lines.back();
-            }),
-            "statistics store " + store_->path() +
-                ": attempt to write a readonly database: check owner and permissions of the file "
-                "and its folder; 1 values wait for the next commit");
   ASSERT_EQ(chmod(store_->path().c_str(), 0600), 0);
-  EXPECT_EQ(asAnother(readAll), "statistics store " + store_->path() +
-                                    ": unable to open database file (Permission denied): check "
-                                    "owner and permissions of the file and its folder\n");
+  asAnother(where + "unable to open database file" + advice + "\n", readAll);
 }
 
 // A writer whose every transaction adds one to a scalar and three values to a distribution, and
