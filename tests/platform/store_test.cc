@@ -545,12 +545,16 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   restricted(full,
              where + "disk I/O error (File too large): check the file system that holds it" + waits,
              writeAndTell);
+  const std::string log = store_->path() + "-wal";
+  std::filesystem::remove(log);
+  std::filesystem::remove(store_->path() + "-shm");
   ASSERT_EQ(chmod(store_->path().c_str(), 0444), 0);
   ASSERT_EQ(chmod(folder.c_str(), 0555), 0);
   asAnother("k=1;", readAll);
   asAnother(where + "attempt to write a readonly database" + advice + waits, writeAndTell);
-  const std::string log = store_->path() + "-wal";
+  ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
   root_.write(std::string(kStorePath) + "-wal", "left behind");
+  ASSERT_EQ(chmod(folder.c_str(), 0555), 0);
   asAnother(where + "unable to open database file" + advice +
                 "; its write-ahead log is only readable where the folder can be written: have a "
                 "user who may write run 'tavrelctl stat list' once\n",
