@@ -19,6 +19,9 @@ nlohmann::json jsonOf(const Outcome& outcome) {
 
 TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const TemporaryDevice device;
+  const std::string kNoXmlText =
+      "tavrelctl: cannot be stored: property lists hold no control characters and only UTF-8: give "
+      "such bytes as --plist '{\"$data\": \"BASE64\"}'\n";
   const struct {
     std::vector<std::string> arguments;
     std::string error;
@@ -30,7 +33,12 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "tavrelctl: not a preference domain: ../a: give a name such as com.example.app, without "
        "slashes\n"},
       {{"log", "preview", "--day", "soon"},
-       "tavrelctl: not a day: soon: give a 32-bit day number or YYYY-MM-DD\n"},
+       "tavrelctl: not a day: soon: give today, yesterday, a 32-bit day number or YYYY-MM-DD\n"},
+      {{"--root", "", "status"}, "tavrelctl: --root: names no folder: see 'tavrelctl --help'\n"},
+      {{"prefs", "set", "a", "k", "x\x01"}, kNoXmlText},
+      {{"prefs", "set", "a", "k\xff", "x"}, kNoXmlText},
+      {{"prefs", "set", "a", "k", "[{\"\xEF\xBF\xBE\": 1}]", "--plist"}, kNoXmlText},
+      {{"prefs", "set", "a", "k", "@1e300", "--date"}, ""},
       {{"prefs", "set", "a", "k", "1", "--int", "--bool"}, ""},
       {{"log", "show", "--raw", "--json"}, ""},
       {{"status", "--wrong"}, ""},
@@ -44,6 +52,17 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       EXPECT_EQ(outcome.error, error);
     }
   }
+  const std::string none = device.path("/none");
+  for (const auto& arguments : {std::vector<std::string>{"status"}, {"stat", "set", "k", "1"}}) {
+    auto elsewhere = arguments;
+    elsewhere.insert(elsewhere.end(), {"--root", none});
+    EXPECT_EQ(device.run(elsewhere),
+              (Outcome{1, "",
+                       "tavrelctl: cannot use device root " + none +
+                           "/: No such file or directory: name the device's folder with --root or "
+                           "TAVREL_ROOT\n"}));
+  }
+  EXPECT_FALSE(std::filesystem::exists(none));
   EXPECT_EQ(device.run({"--version"}), prints("tavrelctl 0.1.0\n"));
   for (const std::vector<std::string>& help :
        {std::vector<std::string>{"--help"}, {"prefs", "set", "--help"}, {"log", "--help"}}) {
@@ -87,7 +106,7 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
   EXPECT_EQ(device.run({"prefs", "list", "com.example.a"}),
             prints("KEY   TYPE        VALUE\n"
                    "flag  string      \"true\"\n"
-                   "key   dictionary  {\"a\": \"<ff>\", \"b\": [1]}\n"));
+                   "key   dictionary  {\"a\": <ff>, \"b\": [1]}\n"));
   EXPECT_EQ(device.run({"prefs", "list"}), prints("com.example.a\n"));
   EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), prints(""));
   const Outcome absent{1, "",
@@ -95,6 +114,23 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
                        "list com.example.a' shows what there is\n"};
   EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), absent);
   EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "key"}), absent);
+
+  device.write("/var/mobile/Library/Preferences/com.example.bad.plist", "nonsense");
+  for (const std::vector<std::string>& reading :
+       {std::vector<std::string>{"list", "com.example.bad"},
+        {"get", "com.example.bad", "key"},
+        {"delete", "com.example.bad", "key"}}) {
+    auto arguments = reading;
+    arguments.insert(arguments.begin(), "prefs");
+    const Outcome outcome = device.run(arguments);
+    EXPECT_EQ(outcome.status, 1) << outcome;
+    EXPECT_EQ(std::count(outcome.error.begin(), outcome.error.end(), '\n'), 1) << outcome;
+    EXPECT_NE(outcome.error.find("com.example.bad.plist"), std::string::npos) << outcome;
+  }
+  const Outcome large =
+      device.run({"prefs", "set", "com.example.a", "flag", std::string(9U << 20, 'x')});
+  EXPECT_EQ(large.status, 1) << large.error;
+  EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "flag"}), prints("true\n"));
 }
 
 TEST(Plist, ConvertsBetweenAllForms) {
@@ -116,6 +152,15 @@ TEST(Plist, ConvertsBetweenAllForms) {
             (Outcome{1, "",
                      "tavrelctl: cannot write /dev/null: it is no regular file: use -o - and "
                      "redirect\n"}));
+  EXPECT_EQ(device.run({"plist", "convert", "-", "-o", device.path("/no/x")}, json),
+            (Outcome{1, "",
+                     "tavrelctl: cannot write " + device.path("/no/x") + ": " + device.path("/no") +
+                         ": No such file or directory\n"}));
+  EXPECT_FALSE(std::filesystem::exists(device.path("/no")));
+  EXPECT_EQ(device.run({"plist", "show", "-"}, "hello"),
+            (Outcome{1, "",
+                     "tavrelctl: standard input: neither a property list nor JSON: it begins "
+                     "neither with \"bplist00\" nor with \"<\"\n"}));
   EXPECT_EQ(device.run({"plist", "show", "-"}, "[1,"),
             (Outcome{1, "",
                      "tavrelctl: standard input: parse error at line 1, column 4: syntax error "
@@ -132,6 +177,7 @@ void fill(const TemporaryDevice& device) {
   const Outcome imported = device.run({"stat", "import", "-"},
                                       "scalar\t20000\tapp.starts\t12345\n"
                                       "scalar\t20000\tapp.secret\t7\n"
+                                      "scalar\t-2147483648\tapp.starts\t1\n"
                                       "value\t20000\tapp.load\t1\t1\n"
                                       "value\t20000\tapp.load\t2\t2\n"
                                       "value\t20000\tapp.load\t3\t3\n"
@@ -165,6 +211,11 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
       "histogram": [{"bucket": "(-inf, 2]", "count": 2}, {"bucket": "(2, 3]", "count": 1},
                     {"bucket": "(3, inf)", "count": 1}]}})json"));
 
+  const auto first =
+      jsonOf(device.run({"log", "preview", "--day", "-2147483648", "--json"}))["log"];
+  EXPECT_EQ(first["day"], -2147483648);
+  EXPECT_EQ(first["start"], "-5877641-06-23T00:00:00Z");
+
   EXPECT_EQ(device.run({"log", "preview", "--day", "19999"}),
             (Outcome{1, "",
                      "tavrelctl: no log would be submitted for day 19999 (2024-10-03): no "
@@ -187,6 +238,10 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   const Outcome outcome = device.run({"log", "preview", "--day", "20000"});
   EXPECT_EQ(outcome.status, 1);
   EXPECT_TRUE(outcome.error.ends_with("; the next run sets it aside\n")) << outcome;
+  for (const std::vector<std::string>& reading :
+       {std::vector<std::string>{"status"}, {"stat", "list"}, {"stat", "export"}}) {
+    EXPECT_EQ(device.run(reading).status, 1);
+  }
   EXPECT_EQ(device.files(), damaged);
 }
 
@@ -223,6 +278,8 @@ TEST(LogShow, DrawsTheTableOfASubmittedLog) {
                 "pending  2024-10-04T03:00:01Z  165   StorageStatus     19  StorageStatus-a.log\n"
                 "pending  2024-10-05T03:00:01Z  193   log-tallied     %zu  log-tallied-b.log\n",
                 log.size())));
+  // A folder is no log, whatever its name.
+  std::filesystem::create_directories(device.path(kPending) + "folder.log");
   EXPECT_EQ(device.run({"log", "show"}, "", 60),
             prints("Log           " + device.path(kPending) + R"(log-tallied-b.log (pending)
 Type          193
@@ -270,6 +327,40 @@ Activated applications (1)
   EXPECT_EQ(json["scalars"], nlohmann::json::parse(R"({"app.starts": 12000, "app.x": -7})"));
   EXPECT_EQ(json["distributions"]["app.none"]["standard_deviation"], nullptr);
   EXPECT_EQ(json["created"], "2024-10-05T03:00:00Z");
+  EXPECT_EQ(json["faults"], nlohmann::json::array());
+
+  // Of two logs of one second the one that was written later is the latest.
+  const std::string odd = xmlOf(R"json({
+    "BHScalars": "x", "BHOther": 1, "BHDistributions": {"a": [{"$real": "nan"}, 1, 1, 1, 0], "b": 1},
+    "BHDistributionsHistogram": {"a": {"(1, 2]": "x"}, "c": {}}})json");
+  device.write(std::string(kPending) + "log-tallied-a.log", odd);
+  std::filesystem::copy_file(device.path(kPending) + "log-tallied-b.metadata.plist",
+                             device.path(kPending) + "log-tallied-a.metadata.plist");
+  const auto written =
+      std::filesystem::last_write_time(device.path(kPending) + "log-tallied-b.log");
+  std::filesystem::last_write_time(device.path(kPending) + "log-tallied-a.log",
+                                   written + std::chrono::microseconds(1));
+  const auto mistyped = jsonOf(device.run({"log", "show", "--json"}))["log"];
+  EXPECT_EQ(mistyped["distributions"]["a"]["minimum"],
+            nlohmann::json::parse(R"({"$real": "nan"})"));
+  EXPECT_EQ(mistyped["faults"], nlohmann::json::parse(R"([
+      "BHDistributions/b: is no summary of five numbers",
+      "BHDistributionsHistogram/a/(1, 2]: is a string, not a number",
+      "BHDistributionsHistogram/c: belongs to no summary in BHDistributions",
+      "BHOther: is no part of a tallied log",
+      "BHScalars: is a string, not a dictionary"])"));
+  const Outcome shown = device.run({"log", "show"});
+  EXPECT_NE(shown.out.find("\nNot as a tallied log has it (5)\n  BHDistributions/b: is no"),
+            std::string::npos)
+      << shown;
+  const std::string other = device.path(kPending) + "log-tallied-b.metadata.plist";
+  EXPECT_EQ(device.run({"log", "show", other}),
+            (Outcome{1, "",
+                     "tavrelctl: not a tallied log: " + other +
+                         ": 'tavrelctl plist show FILE' shows it\n"}));
+  std::filesystem::remove(other);
+  EXPECT_EQ(device.run({"log", "list"}).error,
+            "tavrelctl: 1 log without metadata: cannot read " + other + ": No such file or directory\n");
 }
 
 TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {

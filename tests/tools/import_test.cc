@@ -1,4 +1,5 @@
 #include <bit>
+#include <csignal>
 #include <cstdint>
 #include <fstream>
 #include <gtest/gtest.h>
@@ -129,9 +130,9 @@ TEST(StatImport, ExportGivesBackWhatWasImported) {
             prints("{\n  \"format_version\": 1,\n  \"file\": \"" + other.path("/lines") +
                    "\",\n  \"scalars\": 2,\n  \"values\": 0\n}\n"));
   EXPECT_EQ(other.run({"stat", "import", "-"}, "value\t1\td\t7\t0x1p1\n").status, 0);
-  EXPECT_EQ(other.run({"stat", "list"}), prints("DAY             KIND          KEY     VALUE\n"
-                                                "1 (1970-01-02)  scalar        k           2\n"
-                                                "1 (1970-01-02)  distribution  d    1 values\n"));
+  EXPECT_EQ(other.run({"stat", "list"}), prints("DAY             KIND          KEY    VALUE\n"
+                                                "1 (1970-01-02)  scalar        k          2\n"
+                                                "1 (1970-01-02)  distribution  d    1 value\n"));
   EXPECT_EQ(other.run({"stat", "list", "d", "--json"}).out,
             "{\n  \"format_version\": 1,\n  \"scalars\": [],\n  \"distributions\": [\n    {\n"
             "      \"key\": \"d\",\n      \"day\": 1,\n      \"date\": \"1970-01-02\",\n"
@@ -155,7 +156,16 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   EXPECT_EQ(device.run({"stat", "record", "d", "--", "-1.5", "0x1p-1", "-inf"}), prints(""));
   EXPECT_EQ(device.run({"stat", "record", "d", "2", "x"}).status, 2);
 
-  std::istringstream lines(device.run({"stat", "export"}).out);
+  for (const char* key : {"a\tb", "a\nb", "a\xff"}) {
+    for (const char* command : {"set", "add", "record"}) {
+      const Outcome refused = device.run({"stat", command, key, "1"});
+      EXPECT_EQ(refused.status, 2) << refused;
+      EXPECT_TRUE(refused.error.starts_with("tavrelctl: not a key: a\\")) << refused;
+    }
+  }
+
+  EXPECT_EQ(device.run({"stat", "export", "--day", "yesterday"}), prints(""));
+  std::istringstream lines(device.run({"stat", "export", "--day", "today"}).out);
   std::string kind, day, key, number;
   lines >> kind >> day >> key >> number;
   EXPECT_EQ(kind + key + number, "scalark9223372036854775802");
@@ -186,7 +196,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
   device.write("/sys/class/thermal/thermal_zone1/temp", "30000\n");
   const Outcome collected = device.run({"stat", "collect", "--seconds", "1"});
   EXPECT_EQ(collected.status, 0);
-  EXPECT_EQ(collected.out, "kept 2 samples of this machine, taken over 1 seconds\n");
+  EXPECT_EQ(collected.out, "kept 2 samples of this machine, taken over 1 second\n");
   EXPECT_EQ(collected.error.substr(0, 60),
             "tavrelctl: not recorded, as the machine did not tell in this");
 
@@ -212,6 +222,21 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
             "load.one_minute=0.25 load.one_minute=0.25 memory.used_percent=75 "
             "memory.used_percent=75 network.received_kib_per_second=0 "
             "network.sent_kib_per_second=0 temperature.celsius=41.5 temperature.celsius=41.5 ");
+}
+
+TEST(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {
+  const TemporaryDevice device;
+  sigset_t term, before;
+  sigemptyset(&term);
+  sigaddset(&term, SIGTERM);
+  pthread_sigmask(SIG_BLOCK, &term, &before);
+  raise(SIGTERM);
+  EXPECT_EQ(device.run({"stat", "collect", "--seconds", "3600"}),
+            (Outcome{0, "kept 1 sample of this machine, taken over 0 seconds\n",
+                     "tavrelctl: ended by a signal before 3600 seconds were over\n"}));
+  pthread_sigmask(SIG_SETMASK, &before, nullptr);
+  EXPECT_TRUE(
+      device.run({"stat", "export", "com.norvane.usage.samples"}).out.ends_with("samples\t1\n"));
 }
 
 }  // namespace

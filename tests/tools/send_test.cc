@@ -75,7 +75,7 @@ TEST_F(SendTest, SendsWhatTheServiceUnderstands) {
                      "uuid": "00112233-4455-6677-8899-aABBccddEEff"}])"),
             0)
       << error;
-  EXPECT_EQ(out, "Delivered 1 applications.\n");
+  EXPECT_EQ(out, "Delivered 1 application.\n");
   while (received.size() < 3 && loop.runSlice(10s) == EventLoop::Slice::HandledEvent) {
   }
   EXPECT_EQ(
@@ -84,7 +84,7 @@ TEST_F(SendTest, SendsWhatTheServiceUnderstands) {
           R"({"operation": 0})", R"({"operation": 1, "value": 20773})",
           R"({"app_data": [{"arch": 12, "bundle_id": "org.example", "orbo_id": 0, )"
           R"("uuid": "<00112233445566778899aabbccddeeff>", "version": "1"}], "operation": 2})"}));
-  EXPECT_EQ(run({"send", "force", "yesterday"}), 2);
+  EXPECT_EQ(run({"send", "force", "tomorrow"}), 2);
 }
 
 TEST_F(SendTest, ChecksApplicationsBeforeItSends) {
@@ -108,6 +108,11 @@ TEST_F(SendTest, ChecksApplicationsBeforeItSends) {
 TEST_F(SendTest, NotificationsArePostedAndAwaited) {
   EXPECT_EQ(run({"notify", "wait", "org.example.n", "--timeout", "0"}), 1);
   EXPECT_EQ(error, "tavrelctl: org.example.n was not posted within 0 seconds\n");
+  for (const std::string timeout : {"nan", "abc", "-1", "1x"}) {
+    EXPECT_EQ(run({"notify", "wait", "org.example.n", "--timeout", timeout}), 2);
+    EXPECT_EQ(error,
+              "tavrelctl: not a number of seconds: " + timeout + ": give 0 or more, such as 2.5\n");
+  }
   EXPECT_EQ(run({"notify", "post", "org.example.n"}), 0) << error;
   EXPECT_EQ(out, "org.example.n: posted 1 time\n");
   EXPECT_EQ(run({"notify", "post", "org.example.n", "--json"}), 0) << error;

@@ -119,8 +119,10 @@ TEST(Days, AreNumbersOrDates) {
   for (const std::string_view text : {"", "1x", "2147483648", "2026-02-30", "5881580-07-12"}) {
     ASSERT_FALSE(parseDay(text)) << text;
   }
-  EXPECT_EQ(parseDay("1x").error().message,
-            "not a day: 1x: give a 32-bit day number or YYYY-MM-DD");
+  EXPECT_EQ(parseDay("today").error().message,
+            "not a day: today: give a 32-bit day number or YYYY-MM-DD");
+  EXPECT_EQ(*parseDay("today", 20773), 20773);
+  EXPECT_EQ(*parseDay("yesterday", 20773), 20772);
 }
 
 TEST(Table, AlignsAndCutsTheWidestColumn) {
@@ -143,6 +145,11 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
             "  ü                1\n"
             "  a\\x1b[31m\\n\\…   10\n"
             "  a long key i…  100\n");
+  // In a pipe nothing is cut, and a long cell pushes only its own row.
+  const std::string longKey(100, 'k');
+  table.add({longKey, "1"});
+  EXPECT_EQ(print(std::nullopt).substr(0, 55), "  KEY" + std::string(50, ' ') + "N");
+  EXPECT_TRUE(print(std::nullopt).ends_with("\n  " + longKey + "    1\n"));
   EXPECT_EQ(bar(1, 1000000, 40), "#");
   EXPECT_EQ(bar(20, 40, 40), std::string(20, '#'));
   EXPECT_EQ(bar(0, 40, 40), "");
@@ -185,6 +192,10 @@ TEST(ValueText, ShowsTheKindOfAValue) {
             "  [4] = nan\n"
             "c:\n"
             "  d = \"e\\u001b\"\n");
+  EXPECT_EQ(inlineText(plist::Dictionary{
+                {"b", plist::Array{true, false, 2.0, plist::Data(asBytes("\xff"))}},
+                {"a\n", plist::Dictionary{{"c", plist::Date::ofDay(0)}}}}),
+            R"({"a\n": {"c": 1970-01-01 00:00:00 +0000}, "b": [true, false, 2.0, <ff>]})");
 }
 
 }  // namespace
