@@ -56,7 +56,7 @@ class Device:
 
 
 def run_once(command, environment):
-    """CPU and wall seconds and peak KiB of one run whose output is thrown away."""
+    """CPU and wall seconds of one run whose output is thrown away."""
     with open(os.devnull, "r+b") as null:
         started = time.monotonic()
         process = subprocess.Popen(command, env=environment, stdin=null, stdout=null, stderr=null)
@@ -65,15 +65,25 @@ def run_once(command, environment):
     process.returncode = os.waitstatus_to_exitcode(status)
     if process.returncode != 0:
         raise SystemExit(f"{command[0]} ended with status {process.returncode}")
-    return usage.ru_utime + usage.ru_stime, wall, usage.ru_maxrss
+    return usage.ru_utime + usage.ru_stime, wall
+
+
+def peak_mebibytes(command, environment):
+    """Of one run. GNU time starts it, since a process counts the memory of the one it came from."""
+    with tempfile.NamedTemporaryFile("r") as file:
+        subprocess.run(["/usr/bin/time", "-f", "%M", "-o", file.name, *command], env=environment,
+                       check=True, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
+                       stderr=subprocess.DEVNULL)
+        return int(file.read()) / 1024
 
 
 def measure(label, command, environment, baseline=None, runs=RUNS):
     run_once(command, environment)
     results = [run_once(command, environment) for _ in range(runs)]
-    cpu, wall, memory = (statistics.median(column) for column in zip(*results))
+    cpu, wall = (statistics.median(column) for column in zip(*results))
+    memory = peak_mebibytes(command, environment)
     ratio = f"   ratio {cpu / baseline:6.2f}" if baseline else ""
-    print(f"  {label:<44} {cpu * 1e3:8.2f} ms CPU {wall * 1e3:8.2f} ms {memory / 1024:7.1f} MiB"
+    print(f"  {label:<44} {cpu * 1e3:8.2f} ms CPU {wall * 1e3:8.2f} ms {memory:7.1f} MiB"
           f"{ratio}")
     return cpu
 
@@ -95,7 +105,7 @@ def import_rates(device):
         with open(path, "w", encoding="ascii") as file:
             file.writelines(lines)
         command = [os.path.join(device.bin, "tavrelctl"), "stat", "import", path]
-        _, wall, _ = run_once(command, device.environment)
+        _, wall = run_once(command, device.environment)
         print(f"  {label:<44} {len(lines) / wall:12,.0f} lines/s")
 
 

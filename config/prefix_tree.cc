@@ -1,6 +1,7 @@
 #include "config/prefix_tree.h"
 
 #include <algorithm>
+#include <cstring>
 
 namespace tavrel {
 namespace {
@@ -18,7 +19,7 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
   prefixes_.erase(std::unique(prefixes_.begin(), prefixes_.end()), prefixes_.end());
   if (prefixes_.empty()) return;
   nodes_.emplace_back();
-  branch_.push_back(0);
+  branches_.push_back(0);
   build();
 }
 
@@ -44,33 +45,33 @@ void PrefixTree::build() {
         ++after;
       pending.push_back({nodes_.size(), at, after});
       nodes_.emplace_back();
-      branch_.push_back(static_cast<unsigned char>(next));
+      branches_.push_back(next);
       at = after;
     }
-    nodes_[range.node] = {static_cast<std::uint32_t>(range.begin),
-                          static_cast<std::uint32_t>(depth), static_cast<std::uint32_t>(firstChild),
+    nodes_[range.node] = {std::string_view(prefixes_[range.begin]).substr(0, depth),
+                          static_cast<std::uint32_t>(firstChild),
                           static_cast<std::uint16_t>(nodes_.size() - firstChild), isPrefix};
   }
 }
 
-const PrefixTree::Node* PrefixTree::childFor(const Node& node, unsigned char next) const {
-  const auto begin = branch_.begin() + node.firstChild;
-  const auto end = begin + node.childCount;
-  const auto at = std::lower_bound(begin, end, next);
-  if (at == end || *at != next) return nullptr;
-  return &nodes_[static_cast<std::size_t>(at - branch_.begin())];
+const PrefixTree::Node* PrefixTree::childFor(const Node& node, char next) const {
+  if (node.childCount == 0) return nullptr;
+  const char* branches = branches_.data() + node.firstChild;
+  const void* found = std::memchr(branches, static_cast<unsigned char>(next), node.childCount);
+  if (!found) return nullptr;
+  return &nodes_[node.firstChild +
+                 static_cast<std::size_t>(static_cast<const char*>(found) - branches)];
 }
 
 std::optional<std::string_view> PrefixTree::longestMatch(std::string_view key) const {
   std::optional<std::string_view> longest;
   std::size_t compared = 0;
   for (const Node* node = nodes_.empty() ? nullptr : nodes_.data(); node;) {
-    const std::string_view text = std::string_view(prefixes_[node->prefix]).substr(0, node->depth);
-    if (!key.substr(compared).starts_with(text.substr(compared))) break;
-    if (node->isPrefix) longest = text;
-    compared = node->depth;
+    if (!key.substr(compared).starts_with(node->text.substr(compared))) break;
+    if (node->isPrefix) longest = node->text;
+    compared = node->text.size();
     if (key.size() == compared) break;
-    node = childFor(*node, static_cast<unsigned char>(key[compared]));
+    node = childFor(*node, key[compared]);
   }
   return longest;
 }

@@ -16,28 +16,28 @@ class PrefixTree {
  public:
   PrefixTree() = default;
   explicit PrefixTree(std::vector<std::string> prefixes);
+  PrefixTree(PrefixTree&&) = default;
+  PrefixTree& operator=(PrefixTree&&) = default;
 
   /// The longest prefix that `key` begins with, borrowed from the tree; nothing when there is none.
   std::optional<std::string_view> longestMatch(std::string_view key) const;
 
  private:
-  // A node stands for the text from the root to it, which is the beginning of all prefixes below.
-  // `depth` is the length of that text. The children of a node lie side by side, ordered by the
-  // byte that follows its text.
+  // A node stands for the text from the root to it, which is the beginning of all prefixes below
+  // it and borrowed from one of them. The children of a node lie side by side.
   struct Node {
-    std::uint32_t prefix;  // any prefix below the node, which spells its text
-    std::uint32_t depth;
+    std::string_view text;
     std::uint32_t firstChild;
     std::uint16_t childCount;
     bool isPrefix;  // the node's text is itself a prefix
   };
 
   void build();
-  const Node* childFor(const Node& node, unsigned char next) const;
+  const Node* childFor(const Node& node, char next) const;
 
   std::vector<std::string> prefixes_;  // sorted, each once
   std::vector<Node> nodes_;            // the root first
-  std::vector<unsigned char> branch_;  // for each node the byte that leads to it
+  std::vector<char> branches_;         // for each node the byte that leads to it
 };
 
 }  // namespace tavrel

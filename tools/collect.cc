@@ -1,11 +1,13 @@
 #include "tools/collect.h"
 
+#include <algorithm>
+#include <cerrno>
 #include <chrono>
 #include <cmath>
+#include <csignal>
 #include <optional>
 #include <ostream>
 #include <string>
-#include <thread>
 #include <vector>
 
 #include "base/arithmetic.h"
@@ -16,6 +18,7 @@
 #include "platform/platform.h"
 #include "tools/collect_sources.h"
 #include "tools/stat_progress.h"
+#include "tools/table.h"
 
 namespace tavrel {
 namespace {
@@ -244,26 +247,67 @@ class Collector {
   bool told_[std::size(kStatistics)] = {};
 };
 
+// Holds SIGINT and SIGTERM back while it lives, so that what was sampled is kept when they come.
+class EndSignals {
+ public:
+  EndSignals() {
+    sigemptyset(&signals_);
+    sigaddset(&signals_, SIGINT);
+    sigaddset(&signals_, SIGTERM);
+    pthread_sigmask(SIG_BLOCK, &signals_, &before_);
+  }
+  ~EndSignals() {
+    // One that came meanwhile asked for the end that this is.
+    while (arriveBefore(Ticks())) {
+    }
+    pthread_sigmask(SIG_SETMASK, &before_, nullptr);
+  }
+  EndSignals(const EndSignals&) = delete;
+  EndSignals& operator=(const EndSignals&) = delete;
+
+  /// Waits until `end`; true at once when one of the signals has come.
+  bool arriveBefore(Ticks end) const {
+    for (;;) {
+      const auto left = std::max(end - std::chrono::steady_clock::now(), Ticks::duration::zero());
+      const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
+      const timespec wait{.tv_sec = seconds.count(),
+                          .tv_nsec = std::chrono::nanoseconds(left - seconds).count()};
+      if (sigtimedwait(&signals_, nullptr, &wait) > 0) return true;
+      if (errno != EINTR) return false;
+    }
+  }
+
+ private:
+  sigset_t signals_;
+  sigset_t before_;
+};
+
 }  // namespace
 
 void collectStatistics(ToolContext& context, std::uint32_t seconds) {
   Collector collector(context);
   const Ticks start = std::chrono::steady_clock::now();
+  const EndSignals signals;
+  std::uint32_t second = 0;
+  bool endsEarly = false;
   {
     StatProgress progress(context);
-    for (std::uint32_t second = 0;; ++second) {
-      std::this_thread::sleep_until(start + std::chrono::seconds(second));
+    for (;; ++second) {
       collector.read();
       progress.show(format("collecting: %u of %u seconds", second, seconds));
-      const bool isLast = second == seconds;
+      endsEarly =
+          second < seconds && signals.arriveBefore(start + std::chrono::seconds(second + 1));
+      const bool isLast = second == seconds || endsEarly;
       if (!isLast && collector.waiting() < kReadingsPerTransaction) continue;
       if (const Status kept = collector.keep(); !kept) return context.fail(kept.error().message);
       if (isLast) break;
     }
   }
-  context.out() << "kept " << collector.count() << " samples of this machine, taken over "
-                << seconds << " seconds\n";
-  if (const std::string keys = collector.missing(); !keys.empty()) {
+  context.out() << "kept " << counted(collector.count(), "sample")
+                << " of this machine, taken over " << counted(second, "second") << '\n';
+  if (endsEarly) context.note(format("ended by a signal before %u seconds were over", seconds));
+  // One reading alone tells of no rates; that need not be said.
+  if (const std::string keys = collector.missing(); collector.count() > 1 && !keys.empty()) {
     context.note("not recorded, as the machine did not tell in this time:" + keys);
   }
 }

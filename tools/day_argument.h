@@ -11,8 +11,10 @@
 
 namespace tavrel {
 
-/// Reads a day number or "YYYY-MM-DD". The error says what is wrong with the text.
-Expected<std::int32_t> parseDay(std::string_view text);
+/// Reads a day number or "YYYY-MM-DD", and with the number of today also "today" and "yesterday".
+/// The error says what is wrong with the text.
+Expected<std::int32_t> parseDay(std::string_view text,
+                                std::optional<std::int32_t> today = std::nullopt);
 
 /// "2026-11-16", for any day number.
 inline std::string dayDateText(std::int32_t day) {

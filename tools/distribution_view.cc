@@ -40,6 +40,12 @@ std::optional<double> DistributionView::standardDeviation() const {
   return std::sqrt(squaredDeviations / static_cast<double>(count));
 }
 
+bool isSummary(const plist::Value& entry) {
+  const plist::Array summary = entry.array();
+  return summary.size() == 5 &&
+         std::all_of(summary.begin(), summary.end(), [](const auto& v) { return v.number(); });
+}
+
 std::vector<DistributionView> distributionsOf(const plist::Dictionary& log) {
   const plist::Dictionary summaries = log.dictionary("BHDistributions");
   const plist::Dictionary histograms = log.dictionary("BHDistributionsHistogram");
@@ -47,8 +53,7 @@ std::vector<DistributionView> distributionsOf(const plist::Dictionary& log) {
   for (const plist::Entry& entry : summaries) {
     const plist::Array summary = entry.value.array();
     const auto numberAt = [&](std::size_t index) { return summary.at(index).number(); };
-    if (summary.size() != 5) continue;
-    if (!numberAt(0) || !numberAt(1) || !numberAt(2) || !numberAt(3) || !numberAt(4)) continue;
+    if (!isSummary(entry.value)) continue;
     views.push_back({std::string(entry.key.view()), numberAt(0)->real(), numberAt(1)->real(),
                      numberAt(2)->real(), numberAt(3)->real(), numberAt(4)->int64(),
                      bucketsOf(histograms.dictionary(entry.key))});

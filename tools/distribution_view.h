@@ -29,6 +29,10 @@ struct DistributionView {
   std::optional<double> standardDeviation() const;
 };
 
+/// Whether an entry of "BHDistributions" is a summary: minimum, maximum, mean, squared deviations,
+/// count.
+bool isSummary(const plist::Value& entry);
+
 /// The distributions of a log, ordered by key. Entries that are no summary are passed over.
 std::vector<DistributionView> distributionsOf(const plist::Dictionary& log);
 

@@ -46,7 +46,14 @@ Expected<std::string> readInput(ToolContext& context, const std::string& file,
 
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
   auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
-  if (!value) return Error{format("%s: %s", name, value.error().message)};
+  if (!value) {
+    // The decoder does not know that JSON would do as well.
+    constexpr std::string_view kNotOne = "not a property list";
+    std::string_view reason = value.error().message;
+    if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};
+    reason.remove_prefix(kNotOne.size());
+    return Error{format("%s: neither a property list nor JSON%s", name, reason)};
+  }
   return value;
 }
 

@@ -193,11 +193,6 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
 
 }  // namespace
 
-Json jsonNumber(double value) {
-  if (std::isfinite(value)) return value;
-  return numberText(value);
-}
-
 Json jsonOf(const plist::Value& value) {
   switch (value.kind()) {
     case Kind::Null:

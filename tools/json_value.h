@@ -23,9 +23,6 @@ namespace tavrel {
 /// Keys are sorted. A null value gives null.
 nlohmann::ordered_json jsonOf(const plist::Value& value);
 
-/// A real number of a report: the number, or its text when it is not finite.
-nlohmann::ordered_json jsonNumber(double value);
-
 /// Reads a document. The error says what is wrong and where.
 Expected<plist::Value> parseJsonValue(std::string_view text);
 

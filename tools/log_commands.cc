@@ -2,8 +2,11 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <cmath>
 #include <memory>
 #include <ostream>
+#include <sys/stat.h>
+#include <tuple>
 #include <vector>
 
 #include "base/arithmetic.h"
@@ -17,13 +20,28 @@
 #include "tools/day_argument.h"
 #include "tools/json_value.h"
 #include "tools/log_document.h"
+#include "tools/log_faults.h"
 #include "tools/overlay_platform.h"
 #include "tools/table.h"
 
 namespace tavrel {
 namespace {
 
-using FiledLog = FileSubmission::FiledLog;
+/// A log, with what the file system knows of its file.
+struct FiledLog : FileSubmission::FiledLog {
+  std::optional<struct stat> status;  // nothing when it cannot be told
+};
+
+// The order in which logs were filed. Metadata tells the second, the file the rest.
+bool isOlder(const FiledLog& a, const FiledLog& b) {
+  const auto order = [](const FiledLog& log) {
+    const auto time = log.metadata.date(kLogMetadataTime);
+    const timespec modified = log.status ? log.status->st_mtim : timespec{};
+    return std::tuple(time ? std::floor(time->secondsSinceEpoch()) : -HUGE_VAL, modified.tv_sec,
+                      modified.tv_nsec);
+  };
+  return order(a) < order(b);
+}
 
 struct Arguments {
   std::string file = "latest";
@@ -43,23 +61,39 @@ std::string fileNameOf(const FiledLog& log) {
 /// The logs of both folders, oldest first.
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context) {
   FileSubmission& submission = context.linuxPlatform().submission();
-  auto logs = submission.logs(FileSubmission::Place::Outbox);
-  if (!logs) return logs;
-  auto pending = submission.logs(FileSubmission::Place::Pending);
-  if (!pending) return pending;
-  logs->insert(logs->end(), std::make_move_iterator(pending->begin()),
-               std::make_move_iterator(pending->end()));
-  std::stable_sort(logs->begin(), logs->end(), [](const FiledLog& a, const FiledLog& b) {
-    const auto first = a.metadata.date(kLogMetadataTime);
-    const auto second = b.metadata.date(kLogMetadataTime);
-    if (!first || !second) return !first && second;
-    return first->secondsSinceEpoch() < second->secondsSinceEpoch();
-  });
+  std::vector<FiledLog> logs;
+  for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
+    auto found = submission.logs(place);
+    if (!found) return found.error();
+    for (FileSubmission::FiledLog& log : *found) {
+      auto status = FileLayer::status(log.path);
+      if (status && !S_ISREG(status->st_mode)) continue;
+      logs.push_back({std::move(log), status});
+    }
+  }
+  std::stable_sort(logs.begin(), logs.end(), isOlder);
   return logs;
 }
 
 std::string textIn(const plist::Dictionary& metadata, std::string_view key) {
   return std::string(metadata.string(key).value_or("?"));
+}
+
+// Says once why logs stand without metadata.
+void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs) {
+  const auto isBare = [](const FiledLog& log) { return log.metadata.empty(); };
+  const auto first = std::find_if(logs.begin(), logs.end(), isBare);
+  if (first == logs.end()) return;
+  const std::string path =
+      first->path.substr(0, first->path.rfind('/') + 1) + first->name + ".metadata.plist";
+  const auto bytes = context.linuxPlatform().fileLayer().read(path, limits::kPropertyListBytes);
+  const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
+  std::string reason = value ? path + ": it is empty or no dictionary" : value.error().message;
+  if (bytes && !value) reason = path + ": " + reason;
+  context.note(format(
+      "%s without metadata: %s",
+      counted(static_cast<std::uint64_t>(std::count_if(logs.begin(), logs.end(), isBare)), "log"),
+      reason));
 }
 
 void list(ToolContext& context) {
@@ -68,7 +102,7 @@ void list(ToolContext& context) {
   Table table({{"PLACE"}, {"FILED"}, {"TYPE"}, {"NAME"}, {"BYTES", Table::Align::Right}, {"FILE"}});
   Json entries = Json::array();
   for (const FiledLog& log : *logs) {
-    const auto status = FileLayer::status(log.path);
+    const auto& status = log.status;
     const auto time = log.metadata.date(kLogMetadataTime);
     if (context.json()) {
       Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
@@ -80,8 +114,12 @@ void list(ToolContext& context) {
                  status ? std::to_string(status->st_size) : "?", fileNameOf(log)});
     }
   }
-  if (context.json()) return context.printJson({{"logs", std::move(entries)}});
-  if (!table.empty()) table.print(context.out(), context.columns());
+  if (context.json()) {
+    context.printJson({{"logs", std::move(entries)}});
+  } else if (!table.empty()) {
+    table.print(context.out(), context.columns());
+  }
+  noteMissingMetadata(context, *logs);
 }
 
 /// The log that `name` means: "latest", the name of a filed log, or a path of this machine.
@@ -137,7 +175,11 @@ void show(ToolContext& context, const Arguments& arguments) {
     return;
   }
   const auto value = plist::read(asBytes(*bytes));
-  if (value && value->dictionary()) return showDocument(context, *envelope, value->dictionary());
+  if (value && !isTalliedLog(*value)) {
+    return context.fail(
+        format("not a tallied log: %s: 'tavrelctl plist show FILE' shows it", envelope->path));
+  }
+  if (value) return showDocument(context, *envelope, value->dictionary());
   showText(context, *envelope, *bytes);
 }
 
@@ -157,14 +199,19 @@ plist::Dictionary metadataOf(Platform& platform, const CapturedLog& log) {
 void preview(ToolContext& context, const Arguments& arguments) {
   OverlayPlatform overlay(context.linuxPlatform());
   Platform& platform = overlay.platform();
-  if (arguments.verbose) {
-    overlay.setLineHandler([&context](const CapturedLine& line) {
+  // A document that lacks something must not pass for the whole.
+  std::vector<std::string> errors;
+  overlay.setLineHandler([&](const CapturedLine& line) {
+    if (arguments.verbose) {
       context.error() << nameOf(line.level) << ": " << printable(line.message) << '\n';
-    });
-  }
-  std::int32_t day = previousDay(platform.statistics.BHDaysSince1970());
+    } else if (line.level == LogLevel::Error) {
+      errors.push_back(line.message);
+    }
+  });
+  const std::int32_t today = platform.statistics.BHDaysSince1970();
+  std::int32_t day = previousDay(today);
   if (!arguments.day.empty()) {
-    const auto parsed = parseDay(arguments.day);
+    const auto parsed = parseDay(arguments.day, today);
     if (!parsed) return context.failUsage(parsed.error().message);
     day = *parsed;
   }
@@ -172,10 +219,15 @@ void preview(ToolContext& context, const Arguments& arguments) {
   BHReport(platform).writeLogForYesterday(day, {});
   if (overlay.logs().empty()) {
     const std::string_view reason = overlay.lastError();
+    if (!errors.empty()) errors.pop_back();
+    for (const std::string& error : errors)
+      context.note(error);
     return context.fail(
         format("no log would be submitted for day %s: %s", dayText(day),
                reason.empty() ? "no whitelisted key has a value on that day" : reason));
   }
+  for (const std::string& error : errors)
+    context.note(error);
   const CapturedLog& log = overlay.logs().back();
   if (!context.json()) {
     context.out() << log.bytes;
@@ -197,7 +249,8 @@ void addLogCommands(CLI::App& app, ToolContext& context) {
       "preview",
       "Print the document that a run would submit, permission given or not; changes nothing");
   previewCommand
-      ->add_option("--day", arguments->day, "Day number or YYYY-MM-DD, UTC (default: yesterday)")
+      ->add_option("--day", arguments->day,
+                   "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
       ->type_name("DAY");
   previewCommand->add_flag("-v,--verbose", arguments->verbose,
                            "Show what the run would write to the system log");

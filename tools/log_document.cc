@@ -10,6 +10,7 @@
 #include "tools/day_argument.h"
 #include "tools/distribution_view.h"
 #include "tools/json_value.h"
+#include "tools/log_faults.h"
 #include "tools/table.h"
 #include "tools/value_text.h"
 
@@ -44,7 +45,7 @@ std::optional<std::int32_t> dayOf(const plist::Dictionary& log) {
   const auto start = log.date("BHStartDate");
   if (!start) return std::nullopt;
   const double day = std::floor(start->secondsSince1970() / 86400.0);
-  if (!(std::abs(day) < 2147483648.0)) return std::nullopt;
+  if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
   return static_cast<std::int32_t>(day);
 }
 
@@ -120,11 +121,11 @@ Json jsonOfDistributions(const std::vector<DistributionView>& views) {
   for (const DistributionView& view : views) {
     const auto deviation = view.standardDeviation();
     Json summary = {{"count", view.count},
-                    {"minimum", jsonNumber(view.minimum)},
-                    {"maximum", jsonNumber(view.maximum)},
-                    {"mean", jsonNumber(view.mean)},
-                    {"sum_of_squared_deviations", jsonNumber(view.squaredDeviations)},
-                    {"standard_deviation", deviation ? jsonNumber(*deviation) : Json(nullptr)}};
+                    {"minimum", jsonOf(view.minimum)},
+                    {"maximum", jsonOf(view.maximum)},
+                    {"mean", jsonOf(view.mean)},
+                    {"sum_of_squared_deviations", jsonOf(view.squaredDeviations)},
+                    {"standard_deviation", deviation ? jsonOf(*deviation) : Json(nullptr)}};
     if (!view.buckets.empty()) {
       Json buckets = Json::array();
       for (const auto& bucket : view.buckets) {
@@ -179,11 +180,19 @@ void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dicti
   printFieldOf(out, "Whitelist", document.get("BHWhitelistDigest"));
   printFieldOf(out, "Tasking", document.get("BHTaskID"));
   printFieldOf(out, "Task digest", document.get("BHTaskDigest"));
-  printField(out, "Settings", std::to_string(document.array("BHTasking").size()));
+  if (const plist::Array tasking = document.array("BHTasking")) {
+    printField(out, "Settings", std::to_string(tasking.size()));
+  }
 
   printValues(out, "Metadata", document.dictionary("BHMetadata"), Table::Align::Left, columns);
   printValues(out, "Scalars", document.dictionary("BHScalars"), Table::Align::Right, columns);
   printDistributions(out, distributionsOf(document), columns);
+
+  if (const auto faults = faultsOf(document); !faults.empty()) {
+    out << format("\nNot as a tallied log has it (%zu)\n", faults.size());
+    for (const std::string& fault : faults)
+      out << "  " << printable(fault) << '\n';
+  }
 
   for (const auto& [title, key] : {std::pair("Tasking settings", "BHTasking"),
                                    std::pair("Activated applications", "BHActivatedAppInfo")}) {
@@ -213,6 +222,7 @@ Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document) {
   log["metadata"] = jsonField(document.get("BHMetadata"));
   log["scalars"] = jsonField(document.get("BHScalars"));
   log["distributions"] = jsonOfDistributions(distributionsOf(document));
+  log["faults"] = faultsOf(document);
   if (const auto apps = document.get("BHActivatedAppInfo")) {
     log["activated_applications"] = jsonField(apps);
   }

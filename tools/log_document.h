@@ -20,7 +20,8 @@ struct LogEnvelope {
   plist::Dictionary metadata;
 };
 
-/// The table form: header, metadata, scalars, distributions, histograms as bars. `document` is the
+/// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
+/// a tallied log has it. `document` is the
 /// log when it is a property list.
 void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dictionary& document,
               std::optional<std::size_t> columns);

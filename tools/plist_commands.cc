@@ -1,6 +1,8 @@
 #include "tools/plist_commands.h"
 
 #include <CLI/CLI.hpp>
+#include <cerrno>
+#include <cstring>
 #include <filesystem>
 #include <memory>
 #include <ostream>
@@ -56,8 +58,15 @@ void convert(ToolContext& context, const Arguments& arguments) {
     return context.fail(
         format("cannot write %s: it is no regular file: use -o - and redirect", arguments.output));
   }
-  const auto path = std::filesystem::absolute(arguments.output).string();
-  const auto written = context.linuxPlatform().fileLayer().replace(path, asBytes(*bytes), 0644);
+  const auto path = std::filesystem::absolute(arguments.output);
+  // Folders that are missing are a slip of the pen here, not something to make.
+  const auto folder = path.parent_path().string();
+  if (!FileLayer::status(folder)) {
+    return context.fail(format("cannot write %s: %s: %s", arguments.output, folder,
+                               std::string_view(std::strerror(errno))));
+  }
+  const auto written =
+      context.linuxPlatform().fileLayer().replace(path.string(), asBytes(*bytes), 0644);
   if (!written) context.fail(written.error().message);
 }
 

@@ -8,6 +8,7 @@
 #include "base/limits.h"
 #include "platform/linux/file_preferences.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/plist/xml.h"
 #include "tools/input_file.h"
 #include "tools/json_value.h"
 #include "tools/table.h"
@@ -36,22 +37,26 @@ bool checkDomain(ToolContext& context, const std::string& domain) {
 }
 
 void failAbsent(ToolContext& context, const Arguments& arguments) {
+  // An unreadable domain has been complained of.
+  if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   context.fail(
       format("no preference %s in domain %s: 'tavrelctl prefs list %s' shows what there is",
              arguments.key, arguments.domain, arguments.domain));
 }
 
-// The system log has said why a domain could not be written.
-void synchronize(ToolContext& context, const std::string& domain) {
-  if (!context.platform().preferences.ZTXPreferencesSynchronize(domain)) {
-    context.fail(format("cannot write preferences: %s: nothing was changed", domain));
+// Stores a value, null to remove the key. When that cannot be done, a note has said why.
+void store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
+  Preferences& preferences = context.preferences();
+  preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
+  if (!preferences.ZTXPreferencesSynchronize(arguments.domain) ||
+      preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain) != value) {
+    context.setExitStatus(kExitFailure);
   }
 }
 
 void get(ToolContext& context, const Arguments& arguments) {
   if (!checkDomain(context, arguments.domain)) return;
-  const auto value =
-      context.platform().preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain);
+  const auto value = context.preferences().ZTXPreferencesGetValue(arguments.key, arguments.domain);
   if (!value) return failAbsent(context, arguments);
   if (context.json()) {
     return context.printJson({{"domain", arguments.domain},
@@ -88,23 +93,29 @@ void set(ToolContext& context, const Arguments& arguments) {
   if (!checkDomain(context, arguments.domain)) return;
   const auto value = valueOf(context, arguments);
   if (!value) return context.failUsage(value.error().message);
+  if (!isXmlText(arguments.key) || !hasXmlTextsOnly(*value)) {
+    return context.failUsage(
+        "cannot be stored: property lists hold no control characters and only UTF-8: give such "
+        "bytes as --plist '{\"$data\": \"BASE64\"}'");
+  }
+  const auto xml = plist::writeXml(*value);
+  if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
   noteTextThatReadsOtherwise(context, arguments);
-  context.platform().preferences.ZTXPreferencesSetValue(arguments.key, *value, arguments.domain);
-  synchronize(context, arguments.domain);
+  // As it will be read back: dates, for one, lose their fraction.
+  store(context, arguments, *plist::readXml(asBytes(*xml)));
 }
 
 void remove(ToolContext& context, const Arguments& arguments) {
   if (!checkDomain(context, arguments.domain)) return;
-  Preferences& preferences = context.platform().preferences;
+  FilePreferences& preferences = context.preferences();
   if (!preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain)) {
     return failAbsent(context, arguments);
   }
-  preferences.ZTXPreferencesSetValue(arguments.key, {}, arguments.domain);
-  synchronize(context, arguments.domain);
+  store(context, arguments, {});
 }
 
 void listDomains(ToolContext& context) {
-  const auto domains = context.linuxPlatform().preferences().domains();
+  const auto domains = context.preferences().domains();
   if (!domains) return context.fail(domains.error().message);
   if (context.json()) return context.printJson({{"domains", *domains}});
   for (const std::string& domain : *domains)
@@ -114,7 +125,8 @@ void listDomains(ToolContext& context) {
 void list(ToolContext& context, const Arguments& arguments) {
   if (arguments.domain.empty()) return listDomains(context);
   if (!checkDomain(context, arguments.domain)) return;
-  const auto values = context.linuxPlatform().preferences().values(arguments.domain);
+  const auto values = context.preferences().values(arguments.domain);
+  if (context.hasComplaints()) context.setExitStatus(kExitFailure);
   if (context.json()) {
     return context.printJson({{"domain", arguments.domain}, {"values", jsonOf(values)}});
   }

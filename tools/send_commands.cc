@@ -16,6 +16,8 @@
 #include "platform/linux/service_client.h"
 #include "tools/day_argument.h"
 #include "tools/input_file.h"
+#include "tools/table.h"
+#include "tools/typed_value.h"
 
 namespace tavrel {
 namespace {
@@ -73,7 +75,7 @@ void send(ToolContext& context, const plist::Dictionary& message, const std::str
 }
 
 void force(ToolContext& context, const std::string& dayArgument) {
-  const auto day = parseDay(dayArgument);
+  const auto day = parseDay(dayArgument, context.platform().statistics.BHDaysSince1970());
   if (!day) return context.failUsage(day.error().message);
   send(context, {{"operation", kForceDay}, {"value", std::int64_t{*day}}},
        format("Asked for the daily tasks of day %s.", dayText(*day)));
@@ -88,21 +90,29 @@ void deliver(ToolContext& context, const std::string& file) {
     return context.fail(format("%s: %s", name, applications.error().message));
   }
   send(context, {{"operation", kDeliver}, {"app_data", *applications}},
-       format("Delivered %llu applications.", std::uint64_t{applications->size()}));
+       format("Delivered %s.", counted(applications->size(), "application")));
 }
 
 void printCount(ToolContext& context, const std::string& name, std::uint64_t count) {
   if (context.json()) return context.printJson({{"name", name}, {"count", count}});
-  context.out() << name << ": posted " << count << (count == 1 ? " time\n" : " times\n");
+  context.out() << name << ": posted " << counted(count, "time") << '\n';
 }
 
-void wait(ToolContext& context, const std::string& name, std::optional<double> seconds) {
+void wait(ToolContext& context, const std::string& name, const std::string& timeout) {
   // Beyond what any wait lasts; a conversion of more would not be defined.
   constexpr double kLongestSeconds = 1e9;
+  double longest = kLongestSeconds;
+  if (!timeout.empty()) {
+    const auto seconds = parseArgument(timeout, ArgumentKind::Real);
+    if (!seconds || !(seconds->number()->real() >= 0)) {
+      return context.failUsage(
+          format("not a number of seconds: %s: give 0 or more, such as 2.5", timeout));
+    }
+    longest = std::min(seconds->number()->real(), kLongestSeconds);
+  }
   const FileNotifications notifications(context.root(), context.platform().log);
   const auto seen = notifications.count(name);
   if (!seen) return context.fail(seen.error().message);
-  const double longest = std::min(seconds.value_or(kLongestSeconds), kLongestSeconds);
   const auto count = notifications.waitBeyond(
       name, *seen, std::chrono::milliseconds(static_cast<std::int64_t>(longest * 1000)));
   if (!count) return context.fail(count.error().message);
@@ -123,13 +133,12 @@ void addNotifyCommands(CLI::App& app, ToolContext& context) {
   CLI::App* group = app.add_subcommand("notify", "Notifications");
   group->require_subcommand(1);
   const auto name = std::make_shared<std::string>();
-  const auto timeout = std::make_shared<std::optional<double>>();
+  const auto timeout = std::make_shared<std::string>();
 
   CLI::App* waitCommand = group->add_subcommand("wait", "Wait until a notification is posted");
   waitCommand->add_option("NAME", *name, "Such as com.norvane.tallied.tavrel.logging")->required();
   waitCommand->add_option("--timeout", *timeout, "Give up after so long, with exit status 1")
-      ->type_name("SECONDS")
-      ->check(CLI::NonNegativeNumber);
+      ->type_name("SECONDS");
   context.addJsonOption(*waitCommand);
   waitCommand->callback([&context, name, timeout] { wait(context, *name, *timeout); });
 
@@ -180,7 +189,7 @@ void addSendCommands(CLI::App& app, ToolContext& context) {
 
   CLI::App* forceCommand = group->add_subcommand("force", "Have the daily tasks of a day run");
   const auto day = std::make_shared<std::string>();
-  forceCommand->add_option("DAY", *day, "Day number or YYYY-MM-DD")->required();
+  forceCommand->add_option("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD")->required();
   forceCommand->callback([&context, day] { force(context, *day); });
 
   CLI::App* deliverCommand = group->add_subcommand("deliver", "Deliver app information");

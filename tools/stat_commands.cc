@@ -16,6 +16,7 @@
 #include "platform/platform.h"
 #include "tools/collect.h"
 #include "tools/day_argument.h"
+#include "tools/import_lines.h"
 #include "tools/import_number.h"
 #include "tools/stat_transfer.h"
 #include "tools/table.h"
@@ -48,9 +49,18 @@ void change(ToolContext& context, Change change) {
   if (!done) context.fail(done.error().message);
 }
 
+// A key that the export could not give back is a slip. False after having said so.
+bool checkKey(ToolContext& context, const std::string& key) {
+  if (isExportable(key)) return true;
+  context.failUsage(format("not a key: %s: give UTF-8 text without tabs and line ends",
+                           std::string_view(key).substr(0, 60)));
+  return false;
+}
+
 // Sets or adds to today's value of a scalar.
 template <Status (SqliteBatch::*operation)(std::int32_t, std::string_view, std::int64_t)>
 void changeScalar(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
   std::int64_t number = 0;
   const char* const end = arguments.number.data() + arguments.number.size();
   const auto [stop, error] = std::from_chars(arguments.number.data(), end, number);
@@ -63,6 +73,7 @@ void changeScalar(ToolContext& context, const Arguments& arguments) {
 }
 
 void record(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
   std::vector<double> values;
   for (const std::string& text : arguments.values) {
     const auto value = parseExactDouble(text);
@@ -84,7 +95,7 @@ void record(ToolContext& context, const Arguments& arguments) {
 bool parseDayOption(ToolContext& context, const std::string& text,
                     std::optional<std::int32_t>& day) {
   if (text.empty()) return true;
-  const auto parsed = parseDay(text);
+  const auto parsed = parseDay(text, context.platform().statistics.BHDaysSince1970());
   if (!parsed) {
     context.failUsage(parsed.error().message);
     return false;
@@ -96,7 +107,7 @@ bool parseDayOption(ToolContext& context, const std::string& text,
 void list(ToolContext& context, const Arguments& arguments) {
   std::optional<std::int32_t> day;
   if (!parseDayOption(context, arguments.day, day)) return;
-  const auto history = context.linuxPlatform().store().openHistory();
+  const auto history = context.storeForReading().openHistory();
   if (!history) return context.fail(history.error().message);
   const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
   const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
@@ -127,8 +138,8 @@ void list(ToolContext& context, const Arguments& arguments) {
             distributions.push_back(rowOf(key, rowDay));
             distributions.back()["count"] = count;
           } else {
-            table.add(
-                {dayText(rowDay), "distribution", std::string(key), format("%lld values", count)});
+            table.add({dayText(rowDay), "distribution", std::string(key),
+                       counted(static_cast<std::uint64_t>(count), "value")});
           }
         });
   }
@@ -155,7 +166,8 @@ void addKey(CLI::App& command, Arguments& arguments) {
 
 void addSelection(CLI::App& command, Arguments& arguments) {
   command.add_option("PREFIX", arguments.key, "Only keys that begin with this");
-  command.add_option("--day", arguments.day, "Only this day: a number or YYYY-MM-DD")
+  command
+      .add_option("--day", arguments.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
       ->type_name("DAY");
 }
 
@@ -199,7 +211,9 @@ void addStatCommands(CLI::App& app, ToolContext& context) {
   CLI::App& recorded = addCommand(*group, "record", "Append values to today's distribution",
                                   arguments, context, record);
   addKey(recorded, *arguments);
-  recorded.add_option("VALUE", arguments->values, "Numbers; put -- before a negative one")
+  recorded
+      .add_option("VALUE", arguments->values,
+                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
       ->required();
 
   CLI::App& listed =

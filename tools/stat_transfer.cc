@@ -63,8 +63,8 @@ void importStream(ToolContext& context, std::istream& in, const std::string& nam
   if (context.json()) {
     context.printJson({{"file", name}, {"scalars", counts.scalars}, {"values", counts.values}});
   } else {
-    context.out() << printable(name) << ": " << counts.scalars << " scalars, " << counts.values
-                  << " values\n";
+    context.out() << printable(name) << ": " << counted(counts.scalars, "scalar") << ", "
+                  << counted(counts.values, "value") << '\n';
   }
 }
 
@@ -102,7 +102,7 @@ void importStatistics(ToolContext& context, const std::string& file) {
 
 void exportStatistics(ToolContext& context, const std::string& prefix,
                       std::optional<std::int32_t> day) {
-  const auto history = context.linuxPlatform().store().openHistory();
+  const auto history = context.storeForReading().openHistory();
   if (!history) return context.fail(history.error().message);
   const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
   const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
@@ -139,6 +139,7 @@ void exportStatistics(ToolContext& context, const std::string& prefix,
             stop = !writer.flushIfLarge();
           }
         });
+    if (context.hasComplaints()) context.setExitStatus(kExitFailure);
   }
   if (!walked) context.fail(walked.error().message);
 }

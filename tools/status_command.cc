@@ -7,6 +7,7 @@
 #include "base/format.h"
 #include "config/persisted_state.h"
 #include "platform/linux/file_layer.h"
+#include "platform/linux/file_preferences.h"
 #include "platform/linux/file_submission.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/sqlite_store.h"
@@ -42,16 +43,16 @@ DeviceStatus takeStatus(ToolContext& context) {
   status.today = platform.statistics.BHDaysSince1970();
   bool hasRun = false;
   const auto lastDay =
-      platform.preferences.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
+      context.preferences().ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
   if (hasRun) status.lastDay = lowInt32(lastDay);
   if (const auto version =
-          platform.preferences.ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
+          context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
     status.osVersion = *version;
   }
-  status.storePath = device.store().path();
+  status.storePath = context.storeForReading().path();
   status.storeBytes = bytesOfStore(status.storePath);
   if (status.storeBytes) {
-    const auto history = device.store().openHistory();
+    const auto history = context.storeForReading().openHistory();
     if (history) {
       status.holdings = (*history)->holdings();
     } else {
@@ -125,6 +126,7 @@ void addStatusCommand(CLI::App& app, ToolContext& context) {
     } else {
       printText(context, status);
     }
+    if (context.hasComplaints()) context.setExitStatus(kExitFailure);
     if (!status.holdings) context.fail(status.holdings.error().message);
     if (!status.pending) context.fail(status.pending.error().message);
   });

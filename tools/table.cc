@@ -12,6 +12,9 @@ namespace {
 constexpr std::string_view kGap = "  ";
 constexpr std::size_t kNarrowestColumn = 8;
 
+// One long key would else push every row of a listing in a pipe far to the right.
+constexpr std::size_t kWidestPadding = 48;
+
 // Control characters, and the marks that turn the direction of the text around them.
 bool actsOnTerminal(char32_t codePoint) {
   return codePoint < 0x20 || (codePoint >= 0x7F && codePoint < 0xA0) ||
@@ -73,6 +76,10 @@ std::string bar(std::uint64_t value, std::uint64_t largest, std::size_t width) {
   return std::string(std::clamp<std::size_t>(marks, 1, std::max<std::size_t>(width, 1)), '#');
 }
 
+std::string counted(std::uint64_t count, std::string_view what) {
+  return format("%llu %s%s", count, what, count == 1 ? "" : "s");
+}
+
 Table::Table(std::vector<Column> columns, std::size_t indent)
     : columns_(std::move(columns)), indent_(indent) {}
 
@@ -92,7 +99,7 @@ void Table::print(std::ostream& out, std::optional<std::size_t> columns) const {
     hasTitles = hasTitles || width > 0;
     for (const auto& row : rows_)
       width = std::max(width, displayWidth(row[i]));
-    widths.push_back(width);
+    widths.push_back(columns ? width : std::min(width, kWidestPadding));
   }
 
   if (columns) {
@@ -116,11 +123,12 @@ void Table::print(std::ostream& out, std::optional<std::size_t> columns) const {
     for (std::size_t i = 0; i < columns_.size(); ++i) {
       const std::string& cell = cellOf(i);
       std::string shown = cell;
-      if (displayWidth(cell) > widths[i]) {
+      if (columns && displayWidth(cell) > widths[i]) {
         shown = firstColumns(cell, widths[i] - 1);
         shown += "…";
       }
-      const std::string padding(widths[i] - displayWidth(shown), ' ');
+      const std::size_t width = displayWidth(shown);
+      const std::string padding(widths[i] > width ? widths[i] - width : 0, ' ');
       if (i > 0) line += kGap;
       line += columns_[i].align == Align::Right ? padding + shown : shown + padding;
     }

@@ -21,6 +21,9 @@ std::size_t displayWidth(std::string_view text);
 /// A bar of `value` out of `largest` in at most `width` columns; at least one mark unless 0.
 std::string bar(std::uint64_t value, std::uint64_t largest, std::size_t width);
 
+/// "1 value", "2 values".
+std::string counted(std::uint64_t count, std::string_view what);
+
 /// Rows of texts in aligned columns, two blanks between them. Cells are made printable.
 class Table {
  public:
@@ -38,7 +41,8 @@ class Table {
   bool empty() const { return rows_.empty(); }
 
   /// With `columns`, the width of a terminal, the widest column of left-aligned text is cut ("…")
-  /// as far as needed to fit. Titles that are all empty are not printed.
+  /// as far as needed to fit; without, cells are whole, and long ones push the rest of their row
+  /// aside. Titles that are all empty are not printed.
   void print(std::ostream& out, std::optional<std::size_t> columns) const;
 
  private:

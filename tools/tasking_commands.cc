@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "config/persisted_state.h"
+#include "platform/linux/file_preferences.h"
 #include "platform/platform.h"
 #include "tools/input_file.h"
 #include "tools/json_value.h"
@@ -32,19 +33,21 @@ struct Tasking {
 };
 
 struct Taskings {
-  explicit Taskings(Platform& platform)
-      : document(platform.preferences.ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)) {
+  explicit Taskings(ToolContext& context)
+      : document(
+            context.preferences().ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)) {
     const plist::Dictionary dictionary = document.dictionary();
     scheduled = {dictionary.get(kTaskingIDKey),
                  {},
                  dictionary.get(kTaskingDigestKey),
                  dictionary.get(kTaskingPayloadKey)};
     const auto get = [&](std::string_view key) {
-      return platform.preferences.ZTXPreferencesGetValue(key, kTavrelDomain);
+      return context.preferences().ZTXPreferencesGetValue(key, kTavrelDomain);
     };
-    applied = {get(kTaskingIDKey), get(kTaskingOSKey), get(kTaskingDigestKey), get(kTaskingPayloadKey)};
+    applied = {get(kTaskingIDKey), get(kTaskingOSKey), get(kTaskingDigestKey),
+               get(kTaskingPayloadKey)};
     lastUpdate = get(kLastOSUpdateKey).dictionary();
-    build = platform.systemVersion.systemVersionDictionary().get(kProductBuildVersionKey);
+    build = context.platform().systemVersion.systemVersionDictionary().get(kProductBuildVersionKey);
   }
 
   /// What the next daily run will do.
@@ -100,7 +103,8 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
 }
 
 void show(ToolContext& context) {
-  const Taskings taskings(context.platform());
+  const Taskings taskings(context);
+  if (context.hasComplaints()) context.setExitStatus(kExitFailure);
   if (context.json()) {
     const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);
     context.printJson({{"scheduled", json(taskings.scheduled)},
@@ -122,11 +126,10 @@ void show(ToolContext& context) {
 }
 
 bool store(ToolContext& context, const plist::Value& tasking) {
-  Preferences& preferences = context.platform().preferences;
+  Preferences& preferences = context.preferences();
   preferences.ZTXPreferencesSetValue(kScheduledTaskingKey, tasking, kScheduleDomain);
   if (preferences.ZTXPreferencesSynchronize(kScheduleDomain)) return true;
-  context.fail("cannot write preference domain " + std::string(kScheduleDomain) +
-               ": see the line before; run as root, or name another device with --root");
+  context.setExitStatus(kExitFailure);  // a note has said why
   return false;
 }
 
@@ -146,13 +149,13 @@ void schedule(ToolContext& context, const std::string& path) {
   if (!findings.empty() || !store(context, *tasking)) return;
 
   const plist::Dictionary dictionary = tasking->dictionary();
-  context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey))) << " with "
-                << dictionary.array("TaskingPayload").size() << " settings. The next daily run "
-                << Taskings(context.platform()).nextRun() << ".\n";
+  context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey)))
+                << " with " << dictionary.array("TaskingPayload").size()
+                << " settings. The next daily run " << Taskings(context).nextRun() << ".\n";
 }
 
 void clear(ToolContext& context) {
-  const Taskings taskings(context.platform());
+  const Taskings taskings(context);
   if (!taskings.document) {
     context.out() << "No tasking is scheduled.\n";
     return;

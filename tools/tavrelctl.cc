@@ -33,7 +33,11 @@ void addGlobalOptions(CLI::App& app, ToolContext& context) {
   app.footer("--root DIR may stand anywhere on the line. See tavrelctl(1).");
   app.set_version_flag("--version", "tavrelctl " TAVREL_VERSION);
   app.add_option_function<std::string>(
-         "--root", [&context](const std::string& folder) { context.setRoot(folder); },
+         "--root",
+         [&context](const std::string& folder) {
+           if (folder.empty()) throw CLI::ValidationError("--root", "names no folder");
+           context.setRoot(folder);
+         },
          "Folder that holds the device's files (default: TAVREL_ROOT, else /)")
       ->type_name("DIR");
 }

@@ -1,12 +1,47 @@
 #include "tools/tool_context.h"
 
+#include <cerrno>
+#include <cstring>
 #include <ostream>
+#include <stdexcept>
 
+#include "base/format.h"
 #include "platform/linux/device_root.h"
+#include "platform/linux/file_layer.h"
+#include "platform/linux/file_preferences.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/sqlite_store.h"
+#include "platform/plist/coding.h"
 #include "tools/table.h"
 
 namespace tavrel {
+
+class ToolContext::NotingLog final : public SystemLog {
+ public:
+  explicit NotingLog(ToolContext& context) : context_(context) {}
+  void write(LogLevel level, std::string_view message) override {
+    if (level < LogLevel::Default) return;
+    context_.note(message);
+    context_.hasComplaints_ = context_.hasComplaints_ || level == LogLevel::Error;
+  }
+
+ private:
+  ToolContext& context_;
+};
+
+struct ToolContext::Services {
+  explicit Services(ToolContext& context)
+      : log(context),
+        preferences(context.root(), context.linuxPlatform().fileLayer(), propertyLists,
+                    context.platform().clock, log),
+        store(context.root(), context.platform().clock, preferences, log,
+              limits::kStoreBusyMilliseconds, true) {}
+
+  NotingLog log;
+  plist::PlistCoding propertyLists;
+  FilePreferences preferences;
+  SqliteStore store;
+};
 
 ToolContext::ToolContext(const ToolStreams& streams) : streams_(streams) {}
 ToolContext::~ToolContext() = default;
@@ -15,6 +50,13 @@ const DeviceRoot& ToolContext::root() {
   if (!root_) {
     root_ = std::make_unique<DeviceRoot>(rootFolder_ ? DeviceRoot(*rootFolder_)
                                                      : DeviceRoot::fromEnvironment());
+    const std::string folder = root_->path("/");
+    if (!FileLayer::status(folder)) {
+      const char* const reason = std::strerror(errno);
+      throw std::runtime_error(format(
+          "cannot use device root %s: %s: name the device's folder with --root or TAVREL_ROOT",
+          folder, reason));
+    }
   }
   return *root_;
 }
@@ -26,6 +68,19 @@ LinuxPlatform& ToolContext::linuxPlatform() {
 
 Platform& ToolContext::platform() {
   return linuxPlatform().platform();
+}
+
+ToolContext::Services& ToolContext::services() {
+  if (!services_) services_ = std::make_unique<Services>(*this);
+  return *services_;
+}
+
+FilePreferences& ToolContext::preferences() {
+  return services().preferences;
+}
+
+SqliteStore& ToolContext::storeForReading() {
+  return services().store;
 }
 
 void ToolContext::addJsonOption(CLI::App& command) {

@@ -27,7 +27,9 @@
 namespace tavrel {
 
 class DeviceRoot;
+class FilePreferences;
 class LinuxPlatform;
+class SqliteStore;
 struct Platform;
 
 /// JSON whose objects keep the order in which their members were added.
@@ -59,11 +61,19 @@ class ToolContext {
 
   // -- The device --------------------------------------------------------------------------------
 
-  /// The folder that `--root` names, else the one of the environment, else "/".
+  /// The folder that `--root` names, else the one of the environment, else "/". Throws
+  /// std::runtime_error when there is no such folder; `runTavrelctl` makes a failure of it.
   const DeviceRoot& root();
   /// Built at the first call over `root()`; include platform/linux/linux_platform.h to use it.
   LinuxPlatform& linuxPlatform();
   Platform& platform();
+  /// The device's preferences; what they have to say appears as notes, not in the system log.
+  FilePreferences& preferences();
+  /// The device's store, to be read only. What it has to say appears as notes, and a damaged store
+  /// stays where it is for the next run.
+  SqliteStore& storeForReading();
+  /// Whether preferences or store have said that something is wrong.
+  bool hasComplaints() const { return hasComplaints_; }
   /// Set by `--root`; takes effect on the first use of the device.
   void setRoot(std::string folder) { rootFolder_ = std::move(folder); }
 
@@ -99,14 +109,20 @@ class ToolContext {
   void setExitStatus(int status) { exitStatus_ = status; }
 
  private:
+  class NotingLog;
+  struct Services;
+
   void printLine(std::string_view message);
+  Services& services();
 
   ToolStreams streams_;
   std::optional<std::string> rootFolder_;
   std::unique_ptr<DeviceRoot> root_;
   std::unique_ptr<LinuxPlatform> linuxPlatform_;
   bool json_ = false;
+  bool hasComplaints_ = false;
   int exitStatus_ = kExitSuccess;
+  std::unique_ptr<Services> services_;  // uses all of the above
 };
 
 }  // namespace tavrel

@@ -1,9 +1,11 @@
 #include "tools/typed_value.h"
 
+#include <algorithm>
 #include <charconv>
 #include <optional>
 
 #include "base/format.h"
+#include "base/utf8.h"
 #include "tools/json_value.h"
 
 namespace tavrel {
@@ -54,6 +56,26 @@ Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind) {
     }
   }
   return plist::Value(text);
+}
+
+bool isXmlText(std::string_view text) {
+  if (!isValidUtf8(text)) return false;
+  while (!text.empty()) {
+    const char32_t codePoint = takeCodePoint(text);
+    const bool isBlank = codePoint == '\t' || codePoint == '\n' || codePoint == '\r';
+    if ((codePoint < 0x20 && !isBlank) || codePoint == 0xFFFE || codePoint == 0xFFFF) return false;
+  }
+  return true;
+}
+
+bool hasXmlTextsOnly(const plist::Value& value) {
+  if (const auto text = value.string()) return isXmlText(*text);
+  const plist::Array array = value.array();
+  if (!std::all_of(array.begin(), array.end(), hasXmlTextsOnly)) return false;
+  for (const plist::Entry& entry : value.dictionary()) {
+    if (!isXmlText(entry.key) || !hasXmlTextsOnly(entry.value)) return false;
+  }
+  return true;
 }
 
 }  // namespace tavrel

@@ -14,4 +14,9 @@ enum class ArgumentKind : std::uint8_t { Text, Boolean, Integer, Real, Date };
 /// The error says what is expected.
 Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind);
 
+/// Whether XML gives the text back: UTF-8 without control characters but tabs and line ends.
+bool isXmlText(std::string_view text);
+/// Whether that is so of all texts and keys in `value`.
+bool hasXmlTextsOnly(const plist::Value& value);
+
 }  // namespace tavrel

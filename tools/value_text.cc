@@ -17,6 +17,17 @@ bool isFilledContainer(const plist::Value& value) {
   return !value.array().empty() || !value.dictionary().empty();
 }
 
+// Borrowed from the dictionary.
+std::vector<std::pair<std::string_view, const plist::Value*>> sortedMembers(
+    const plist::Dictionary& dictionary) {
+  std::vector<std::pair<std::string_view, const plist::Value*>> members;
+  for (const plist::Entry& entry : dictionary)
+    members.emplace_back(entry.key, &entry.value);
+  std::sort(members.begin(), members.end(),
+            [](const auto& a, const auto& b) { return a.first < b.first; });
+  return members;
+}
+
 void printMember(std::ostream& out, std::string_view name, const plist::Value& value,
                  std::size_t indent) {
   out << std::string(indent, ' ') << name;
@@ -59,13 +70,26 @@ std::string kindWithArticle(const plist::Value& value) {
 }
 
 std::string inlineText(const plist::Value& value) {
+  std::string text;
   if (const auto boolean = value.boolean()) return *boolean ? "true" : "false";
-  if (const auto text = value.string()) {
-    std::string quoted;
-    appendQuoted(quoted, *text);
-    return quoted;
+  if (const auto string = value.string()) {
+    appendQuoted(text, *string);
+    return text;
   }
-  std::string text = textOf(value);
+  if (const auto array = value.array()) {
+    for (const plist::Value& element : array)
+      text += (text.empty() ? "" : ", ") + inlineText(element);
+    return '[' + text + ']';
+  }
+  if (const auto dictionary = value.dictionary()) {
+    for (const auto& [key, member] : sortedMembers(dictionary)) {
+      if (!text.empty()) text += ", ";
+      appendQuoted(text, key);
+      text += ": " + inlineText(*member);
+    }
+    return '{' + text + '}';
+  }
+  text = textOf(value);
   if (const auto number = value.number(); number && number->isFloating()) {
     const bool looksLikeInteger = text.find_first_not_of("-0123456789") == std::string::npos;
     if (looksLikeInteger) text += ".0";
@@ -85,13 +109,8 @@ void printOutline(std::ostream& out, const plist::Value& value, std::size_t inde
     }
     return;
   }
-  std::vector<std::pair<std::string_view, const plist::Value*>> members;
   const auto dictionary = value.dictionary();
-  for (const plist::Entry& entry : dictionary)
-    members.emplace_back(entry.key, &entry.value);
-  std::sort(members.begin(), members.end(),
-            [](const auto& a, const auto& b) { return a.first < b.first; });
-  for (const auto& [key, member] : members)
+  for (const auto& [key, member] : sortedMembers(dictionary))
     printMember(out, printable(key), *member, indent);
 }
 

@@ -17,7 +17,7 @@ std::string_view kindName(const plist::Value& value);
 std::string kindWithArticle(const plist::Value& value);
 
 /// A value on one line whose kind can be seen: true, 12, 2.0, "text", 2026-11-16 18:02:18 +0000,
-/// <0102>; containers as base/text.h writes them.
+/// <0102>, [1, {"key": 2}] with sorted keys.
 std::string inlineText(const plist::Value& value);
 
 /// A value over several lines, the content of containers indented by two blanks per level. Keys

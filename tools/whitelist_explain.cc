@@ -208,7 +208,7 @@ Json jsonOf(const std::vector<KeyExplanation>& explanations) {
     }
     Json distribution = jsonOfKind(explanation.distribution);
     if (explanation.bucket) {
-      distribution["value"] = jsonNumber(explanation.example->real);
+      distribution["value"] = jsonOf(explanation.example->real);
       distribution["bucket"] = *explanation.bucket;
     }
     list.push_back({{"key", explanation.key},

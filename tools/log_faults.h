@@ -1,0 +1,18 @@
+// What in a document is not as a tallied log has it.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// Whether a property list is meant to be a tallied log: a dictionary with the parts that make one.
+bool isTalliedLog(const plist::Value& document);
+
+/// Members of a wrong kind or without a meaning, such as "BHScalars: is a string, not a
+/// dictionary", ordered by place. Empty for a good log.
+std::vector<std::string> faultsOf(const plist::Dictionary& log);
+
+}  // namespace tavrel
