@@ -76,10 +76,16 @@ class TemporaryDevice {
 
   Outcome run(std::vector<std::string> arguments, const std::string& input = {},
               std::optional<std::size_t> columns = std::nullopt) const {
+    return runAt(root_.string(), std::move(arguments), input, columns);
+  }
+
+  static Outcome runAt(const std::string& root, std::vector<std::string> arguments,
+                       const std::string& input = {},
+                       std::optional<std::size_t> columns = std::nullopt) {
     std::istringstream in(input);
     std::ostringstream out;
     std::ostringstream error;
-    arguments.insert(arguments.begin(), {"--root", root_.string()});
+    arguments.insert(arguments.begin(), {"--root", root});
     const int status =
         runTavrelctl(arguments, {.in = in, .out = out, .error = error, .columns = columns});
     return {status, out.str(), error.str()};

@@ -148,7 +148,7 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
   // In a pipe nothing is cut, and a long cell pushes only its own row.
   const std::string longKey(100, 'k');
   table.add({longKey, "1"});
-  EXPECT_EQ(print(std::nullopt).substr(0, 55), "  KEY" + std::string(50, ' ') + "N");
+  EXPECT_EQ(print(std::nullopt).substr(0, 55), "  KEY" + std::string(49, ' ') + "N");
   EXPECT_TRUE(print(std::nullopt).ends_with("\n  " + longKey + "    1\n"));
   EXPECT_EQ(bar(1, 1000000, 40), "#");
   EXPECT_EQ(bar(20, 40, 40), std::string(20, '#'));
