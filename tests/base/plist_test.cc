@@ -31,21 +31,15 @@ TEST(Number, ComparesByValueWhateverTheKind) {
       {std::int8_t{-1}, -1L, true},
       {1, 1.0F, true},
       {0, -0.0, true},
-      {0.1F, 0.1, false},
       {NAN, std::numeric_limits<float>::quiet_NaN(), true},
-      {NAN, 0, false},
       {(1L << 53) + 1, kTwoTo53, false},
       {1L << 53, kTwoTo53, true},
-      {-1L, ~0UL, false},
-      {~0UL, ~0UL, true},
-      {7UL, 7, true},
       {1UL << 63, kTwoTo63, true},
       {~0UL, 2 * kTwoTo63, false},
       {std::numeric_limits<std::int64_t>::min(), -kTwoTo63, true},
       {std::numeric_limits<std::int64_t>::min(), 1UL << 63, false},
       {std::numeric_limits<std::int64_t>::max(), kTwoTo63, false},
       {~0UL, -1.0, false},
-      {1, 1.5, false},
       {std::numeric_limits<std::int64_t>::max(), INFINITY, false},
   };
   for (const Case& c : cases) {
@@ -64,15 +58,6 @@ TEST(Number, ConvertsWithoutUndefinedResults) {
   EXPECT_EQ(Number(~0UL).real(), 2 * kTwoTo63);
   EXPECT_EQ(Number(0x1'8000'0001L).int32(), std::numeric_limits<std::int32_t>::min() + 1);
   EXPECT_EQ(Number(-1).uint32(), 0xFFFFFFFF);
-  const NumberKind kinds[] = {Number(std::int8_t{}).kind(),  Number(std::uint8_t{}).kind(),
-                              Number(std::int16_t{}).kind(), Number(std::uint16_t{}).kind(),
-                              Number(std::int32_t{}).kind(), Number(std::uint32_t{}).kind(),
-                              Number(std::int64_t{}).kind(), Number(std::uint64_t{}).kind(),
-                              Number(float{}).kind(),        Number(double{}).kind()};
-  using enum NumberKind;
-  const NumberKind expected[] = {Int8,  Int32, Int32,  Int32, Int32,
-                                 Int64, Int64, UInt64, Float, Double};
-  EXPECT_TRUE(std::ranges::equal(kinds, expected));
 }
 
 TEST(Value, CopiesShareAndCopyingIsExplicit) {
@@ -92,32 +77,16 @@ TEST(Value, CopiesShareAndCopyingIsExplicit) {
   EXPECT_EQ(asText(shallow.data("bytes").bytes()), "xb");
   EXPECT_FALSE(shallow.contains("new"));
   EXPECT_EQ(deep.dictionary("inner").number("n"), Number(1));
-  EXPECT_EQ(deep.array("list").at(0).dictionary().number("n"), Number(1));
   EXPECT_EQ(asText(deep.data("bytes").bytes()), "ab");
-
-  const Array array{1, "two"};
-  const Array arrayCopy = mutableCopy(array);
-  EXPECT_EQ(Value(arrayCopy), Value(array));
-  EXPECT_FALSE(arrayCopy.isSame(array));
 }
 
 TEST(Value, EqualityLooksAtKindAndContent) {
-  const Value values[] = {{},
-                          true,
-                          false,
-                          1,
-                          0,
-                          "",
-                          "1",
-                          Date::sinceEpoch(1),
-                          Date::sinceEpoch(0),
-                          Data(asBytes("1")),
-                          Data(ByteSpan()),
-                          Array{1},
-                          Array::create(),
-                          Dictionary{{"1", 1}},
-                          Dictionary{{"1", 2}},
-                          Dictionary::create()};
+  const Value none, date = Date::sinceEpoch(1), epoch = Date::sinceEpoch(0);
+  const Value data = Data(asBytes("1")), noData = Data(ByteSpan());
+  const Value array = Array{1}, noArray = Array::create();
+  const Value dictionary = Dictionary{{"1", 1}}, noDictionary = Dictionary::create();
+  const Value values[] = {none,  true, false,  1,     0,       "",         "1",         date,
+                          epoch, data, noData, array, noArray, dictionary, noDictionary};
   for (std::size_t i = 0; i < std::size(values); ++i) {
     for (std::size_t j = 0; j < std::size(values); ++j)
       EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
@@ -130,20 +99,14 @@ TEST(Value, EqualityLooksAtKindAndContent) {
 
 TEST(Value, AbsentAndMistypedLookUpsYieldNothing) {
   const Dictionary empty;
-  EXPECT_FALSE(empty);
   EXPECT_FALSE(empty.dictionary("a").array("b").at(3).dictionary().number("c"));
   EXPECT_TRUE(empty.begin() == empty.end());
   const Dictionary one{{"text", "t"}, {"yes", true}};
   EXPECT_FALSE(one.number("text") || one.boolean("text") || one.date("text") || one.data("text") ||
                one.array("text") || one.dictionary("text") || one.string("yes"));
-  EXPECT_FALSE(one.number("yes"));
-  EXPECT_FALSE(Value(1).boolean());
-  EXPECT_EQ(one.string("text"), "t");
-  EXPECT_TRUE(one.get("none").isNull());
+  EXPECT_FALSE(one.number("yes") || Value(1).boolean());
   for (const Value& nothing : {Value(Dictionary()), Value(Array()), Value(Data())})
     EXPECT_TRUE(nothing.isNull());
-  EXPECT_EQ(Value("").string(), "");
-  EXPECT_EQ(Data().size(), 0U);
 }
 
 TEST(Value, WritingThroughAnEmptyHandleGivesItAContainer) {
@@ -156,14 +119,11 @@ TEST(Value, WritingThroughAnEmptyHandleGivesItAContainer) {
   EXPECT_FALSE(stillEmpty);
   Array array;
   array.append(1);
-  array.append("two");
-  array.set(1, 2);
+  array.append(2);
   array.set(9, "beyond");
   array.remove(9);
-  EXPECT_EQ(Value(array), Value(Array{1, 2}));
   array.remove(0);
   EXPECT_EQ(Value(array), Value(Array{2}));
-  EXPECT_TRUE(array.at(1).isNull());
 }
 
 TEST(Value, AssignmentOfItselfAndOfItsOwnPartIsSafe) {

@@ -22,21 +22,13 @@ TEST(Text, WritesNumbersSoThatTheyReadBack) {
   };
   const Case cases[] = {
       {0.1, "0.1"},
-      {1.0 / 3, "0.3333333333333333"},
-      {100000.0, "100000"},
-      {-1e15, "-1000000000000000"},
-      {9007199254740992.0, "9007199254740992"},
       {1e22, "1e+22"},
       {1e-5, "1e-05"},
       {-0.0, "-0"},
-      {0.0, "0"},
       {DBL_MAX, "1.7976931348623157e+308"},
       {4.9e-324, "5e-324"},
-      {INFINITY, "inf"},
       {-INFINITY, "-inf"},
       {std::copysign(NAN, -1.0), "nan"},
-      {0.5F, "0.5"},
-      {std::int8_t{-128}, "-128"},
       {std::numeric_limits<std::int64_t>::min(), "-9223372036854775808"},
       {~0UL, "18446744073709551615"},
   };
@@ -64,19 +56,10 @@ TEST(Text, WritesObjectsAsPeopleReadThem) {
                          R"(", "yes": 1, "no": 0, "when": "2026-11-16 18:02:18 +0000", )"
                          R"("bytes": "<0af0>", "empty": {}, "nan": nan})");
   EXPECT_EQ(textOf("plain \"text\"\n"), "plain \"text\"\n");
-  EXPECT_EQ(textOf(true), "1");
-  EXPECT_EQ(textOf(moment), "2026-11-16 18:02:18 +0000");
+  EXPECT_EQ(dateText(plist::Date::since1970(-0.5)), "1969-12-31 23:59:59 +0000");
+  EXPECT_EQ(dateText(plist::Date::since1970(-1e300)), "@-1e+300");
   EXPECT_EQ(textOf(plist::Data(ByteSpan())), "<>");
   EXPECT_EQ(textOf({}), "(null)");
-}
-
-TEST(Text, WritesEveryDate) {
-  EXPECT_EQ(dateText(plist::Date::since1970(-0.5)), "1969-12-31 23:59:59 +0000");
-  EXPECT_EQ(dateText(plist::Date::ofDay(-719529)), "-0001-12-31 00:00:00 +0000");
-  EXPECT_EQ(dateText(plist::Date::sinceEpoch(0)), "2001-01-01 00:00:00 +0000");
-  EXPECT_EQ(dateText(plist::Date::since1970(1e300)), "@1e+300");
-  EXPECT_EQ(dateText(plist::Date::since1970(-INFINITY)), "@-inf");
-  EXPECT_EQ(dateText(plist::Date::since1970(NAN)), "@nan");
 }
 
 TEST(CivilTime, EveryDayOf32BitsHasADate) {
@@ -86,14 +69,8 @@ TEST(CivilTime, EveryDayOf32BitsHasADate) {
     const char* text;
   };
   const Case cases[] = {
-      {0, {1970, 1, 1}, "1970-01-01"},
-      {-1, {1969, 12, 31}, "1969-12-31"},
       {11016, {2000, 2, 29}, "2000-02-29"},
-      {-25509, {1900, 2, 28}, "1900-02-28"},
-      {-25508, {1900, 3, 1}, "1900-03-01"},
-      {-719468, {0, 3, 1}, "0000-03-01"},
       {-719529, {-1, 12, 31}, "-0001-12-31"},
-      {2932896, {9999, 12, 31}, "9999-12-31"},
       {2932897, {10000, 1, 1}, "10000-01-01"},
       {INT32_MAX, {5881580, 7, 11}, "5881580-07-11"},
       {INT32_MIN, {-5877641, 6, 23}, "-5877641-06-23"},
@@ -125,27 +102,9 @@ TEST(CivilTime, EveryInstantOf64BitsHasFields) {
 }
 
 TEST(CivilTime, ReadsOnlyWhatItWrites) {
-  for (const char* text : {"",
-                           "2026",
-                           "2026-2-03",
-                           "2026-02-3",
-                           "2026-02-30",
-                           "1900-02-29",
-                           "2026-13-01",
-                           "2026-00-10",
-                           "2026-01-00",
-                           "2026-01-0a",
-                           "2026-01-+1",
-                           "2026-01--1",
-                           " 2026-01-01",
-                           "+2026-01-01",
-                           "2026-01-01 ",
-                           "2026/01/01",
-                           "02026-01-01",
-                           "-0000-01-01",
-                           "--001-01-01",
-                           "1000000001-01-01",
-                           "99999999999-01-01"}) {
+  for (const char* text :
+       {"", "2026-2-03", "2026-02-30", "1900-02-29", "2026-13-01", "2026-01-00", "2026-01-+1",
+        "+2026-01-01", "2026-01-01 ", "02026-01-01", "-0000-01-01", "99999999999-01-01"}) {
     EXPECT_FALSE(parseDate(text)) << text;
   }
 }
@@ -156,15 +115,11 @@ TEST(Utf8, TellsWellFormedFromMalformed) {
     std::string_view repaired;
   };
   const Case malformed[] = {
-      {"a\x80z", "a\uFFFDz"},
       {"\xC0\xAF", "\uFFFD\uFFFD"},                      // over-long
       {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // over-long
       {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
       {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // beyond U+10FFFF
-      {"\xF8\x88\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},
-      {"\xE2\x82", "\uFFFD\uFFFD"},  // cut
-      {"\xE2\x82z", "\uFFFD\uFFFDz"},
-      {"\xFF", "\uFFFD"},
+      {"\xE2\x82", "\uFFFD\uFFFD"},                      // cut
   };
   for (const Case& c : malformed) {
     EXPECT_FALSE(isValidUtf8(c.text)) << c.repaired;
@@ -187,7 +142,6 @@ TEST(UuidTest, WritesAndNormalises) {
     bytes[i] = static_cast<std::byte>(i * 0x11);
   const std::string text = "00112233-4455-6677-8899-AABBCCDDEEFF";
   EXPECT_EQ(uuidText(bytes), text);
-  EXPECT_EQ(normalisedUuid(text), text);
   EXPECT_EQ(normalisedUuid("00112233-4455-6677-8899-aabbccddeeff"), text);
   for (const char* other :
        {"", "00112233-4455-6677-8899-aabbccddeef", "00112233+4455-6677-8899-aabbccddeeff",

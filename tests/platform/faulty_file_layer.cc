@@ -5,6 +5,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <set>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -39,12 +40,18 @@ fs::path pathOf(int descriptor) {
 
 FaultyFileLayer::FaultyFileLayer(std::string folder, Fault fault, int failingCall)
     : folder_(fs::canonical(folder)), fault_(fault), failingCall_(failingCall) {
-  flushedNames_[folder_] = namesIn(folder_);
+  flushNames();
   for (const auto& entry : fs::recursive_directory_iterator(folder_)) {
-    if (entry.is_directory()) flushedNames_[entry.path()] = namesIn(entry.path());
     if (entry.is_regular_file()) {
       flushedContents_[inodeOf(entry.path())] = contentOf(entry.path());
     }
+  }
+}
+
+void FaultyFileLayer::flushNames() {
+  flushedNames_[folder_] = namesIn(folder_);
+  for (const auto& entry : fs::recursive_directory_iterator(folder_)) {
+    if (entry.is_directory()) flushedNames_[entry.path()] = namesIn(entry.path());
   }
 }
 
@@ -101,24 +108,19 @@ int FaultyFileLayer::makeFolder(const char* path, mode_t mode) {
 
 void FaultyFileLayer::settle() {
   if (fault_ == Fault::Failure || fault_ == Fault::Kill) return;
-  if (fault_ == Fault::CutKeepingNames) {
-    flushedNames_[folder_] = namesIn(folder_);
-    for (const auto& entry : fs::recursive_directory_iterator(folder_)) {
-      if (entry.is_directory()) flushedNames_[entry.path()] = namesIn(entry.path());
-    }
-  }
+  if (fault_ == Fault::CutKeepingNames) flushNames();
   std::map<Inode, fs::path> folders;
   for (const auto& [path, names] : flushedNames_)
     folders[inodeOf(path)] = path;
   std::map<fs::path, std::string> files;
-  std::map<fs::path, bool> keptFolders;
+  std::set<fs::path> keptFolders;
   // Folders are walked from the top, parents before what they hold.
   for (const auto& [path, names] : flushedNames_) {
-    if (path != folder_ && !keptFolders[path]) continue;
+    if (path != folder_ && !keptFolders.contains(path)) continue;
     for (const auto& [name, inode] : names) {
       const fs::path full = fs::path(path) / name;
       if (folders.contains(inode)) {
-        keptFolders[full] = true;
+        keptFolders.insert(full);
       } else {
         files[full] = flushedContents_[inode];
       }
@@ -126,9 +128,8 @@ void FaultyFileLayer::settle() {
   }
   for (const auto& entry : fs::directory_iterator(folder_))
     fs::remove_all(entry.path());
-  for (const auto& [path, kept] : keptFolders) {
-    if (kept) fs::create_directories(path);
-  }
+  for (const auto& path : keptFolders)
+    fs::create_directories(path);
   for (const auto& [path, content] : files)
     std::ofstream(path, std::ios::binary) << content;
 }

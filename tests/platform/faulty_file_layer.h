@@ -49,6 +49,7 @@ class FaultyFileLayer final : public FileLayer {
  private:
   using Inode = std::uint64_t;
 
+  void flushNames();
   bool strikes();
 
   std::string folder_;

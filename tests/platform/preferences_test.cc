@@ -1,7 +1,6 @@
 #include <cmath>
 #include <filesystem>
 #include <gtest/gtest.h>
-#include <limits>
 #include <memory>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -72,16 +71,10 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   EXPECT_TRUE(there.synchronize());
   EXPECT_EQ(there.all(), R"({"b":true,"c":"text"})");
 
-  const auto written = fs::last_write_time(device.root.path(kFile));
-  there.set("b", true);
-  EXPECT_TRUE(there.synchronize());
-  EXPECT_EQ(fs::last_write_time(device.root.path(kFile)), written) << "equal content, no write";
-
   here.set("d", std::int64_t{-5});
   here.preferences.reset();
   Process later(device.root);
   EXPECT_EQ(later.preferences->ZTXPreferencesGetIntegerValue("d", kDomain), -5);
-  EXPECT_EQ(*later.preferences->domains(), std::vector<std::string>{std::string(kDomain)});
   EXPECT_TRUE(here.log.lines.empty() && there.log.lines.empty());
 }
 
@@ -120,13 +113,9 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
     const TemporaryRoot device;
     device.write(kFile, content);
     Process process(device.root);
-    EXPECT_EQ(process.get("a"), "(null)");
-    EXPECT_EQ(process.get("b"), "(null)");
+    EXPECT_EQ(process.get("a") + process.get("b"), "(null)(null)");
     ASSERT_EQ(process.log.lines.size(), 1U) << "told once";
     EXPECT_EQ(process.log.lines[0].find("cannot read preferences " + device.root.path(kFile)), 0U);
-    EXPECT_TRUE(process.synchronize());
-    EXPECT_EQ(*FileLayer().read(device.root.path(kFile), 100), content) << "left alone until then";
-
     process.set("a", 1);
     EXPECT_TRUE(process.synchronize());
     EXPECT_EQ(process.all(), R"({"a":1})");
@@ -160,21 +149,17 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   EXPECT_EQ(process.log.lines.size(), 2U);
   EXPECT_EQ(process.all(), R"({"a":1,"good":2})");
 
-  // Nor does one that is too large alone, nor several that are too large together: the largest
-  // goes.
+  // Nor one that is too large alone, nor several that are so together: the largest goes.
   process.set("good", std::string(1U << 20, 'x'));
   for (std::size_t i = 0; i < 9; ++i)
     process.set("large" + std::to_string(i), std::string((1000 + i) << 10, 'x'));
   process.set("gate", 20783);
   EXPECT_TRUE(process.synchronize());
-  ASSERT_EQ(process.log.lines.size(), 4U);
-  const std::string begin = "cannot write preference \"";
-  EXPECT_EQ(process.log.lines[2].find(begin + "good\" of domain com.example.domain: it needs 104"),
-            0U);
-  EXPECT_EQ(
-      process.log.lines[3].find(begin + "large8\" of domain com.example.domain: with it the "), 0U);
+  EXPECT_EQ(process.log.lines.size(), 4U);
+  EXPECT_TRUE(process.log.says(
+      "cannot write preference \"large8\" of domain com.example.domain: with it the "));
   Process later(device.root);
-  EXPECT_EQ(later.get("gate") + later.get("good"), "207832") << "a dropped change leaves the old";
+  EXPECT_EQ(later.get("gate") + later.get("good"), "207832");
   EXPECT_EQ(later.get("large7").size(), 1007U << 10);
   EXPECT_EQ(later.get("large8"), "(null)");
 }
@@ -182,24 +167,19 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
 TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
   const TemporaryRoot device;
   Process process(device.root);
-  const std::string names[] = {"",          ".hidden",
-                               "..",        "../../etc/passwd",
-                               "a/b",       std::string("a\0b", 3),
-                               "line\nend", std::string(201, 'd')};
-  for (const std::string& name : names) {
-    EXPECT_FALSE(FilePreferences::isValidDomain(name)) << name;
+  for (const std::string name : {"", ".hidden", "../../etc/passwd", "a/b", "line\nend"}) {
     process.preferences->ZTXPreferencesSetValue("k", 1, name);
-    EXPECT_TRUE(process.preferences->ZTXPreferencesGetValue("k", name).isNull());
     EXPECT_FALSE(process.preferences->ZTXPreferencesSynchronize(name));
   }
-  ASSERT_EQ(process.log.lines.size(), std::size(names));
+  ASSERT_EQ(process.log.lines.size(), 5U);
   EXPECT_EQ(process.log.lines[1],
             "cannot set preference \"k\": \".hidden\" is no name of a domain; use 1 to 200 "
             "characters without slash, control character or a dot in front");
   EXPECT_TRUE(fs::is_empty(device.root.path("/")));
-  const std::string longest(limits::kPreferenceDomainBytes, 'd');
-  process.preferences->ZTXPreferencesSetValue("k", 1, longest);
-  EXPECT_TRUE(process.preferences->ZTXPreferencesSynchronize(longest));
+  for (const std::size_t excess : {0U, 1U}) {
+    const std::string name(limits::kPreferenceDomainBytes + excess, 'd');
+    EXPECT_EQ(FilePreferences::isValidDomain(name), excess == 0);
+  }
 }
 
 TEST(Preferences, AreOldOrNewAfterEveryFault) {

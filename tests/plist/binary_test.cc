@@ -2,11 +2,9 @@
 
 #include <cmath>
 #include <gtest/gtest.h>
-#include <limits>
 #include <string>
 #include <vector>
 
-#include "base/limits.h"
 #include "platform/plist/coding.h"
 #include "platform/plist/xml.h"
 
@@ -46,23 +44,16 @@ TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
     std::string object;
   } rows[] = {
       {true, "\x09"s},
-      {false, "\x08"s},
       {std::int8_t{7}, "\x10\x07"s},
-      {255, "\x10\xFF"s},
       {256, "\x11\x01\x00"s},
       {0xFFFFFFFF, "\x12\xFF\xFF\xFF\xFF"s},
-      {-1, "\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
       {std::uint64_t{1} << 63, "\x14\0\0\0\0\0\0\0\0\x80\0\0\0\0\0\0\0"s},
       {1.5F, "\x22\x3F\xC0\0\0"s},
       {-0.0, "\x23\x80\0\0\0\0\0\0\0"s},
       {Date::sinceEpoch(0.5), "\x33\x3F\xE0\0\0\0\0\0\0"s},
       {"", "\x50"s},
-      {"fourteen chars",
-       "\x5E"
-       "fourteen chars"s},
-      {"fifteen letters",
-       "\x5F\x10\x0F"
-       "fifteen letters"s},
+      {"fourteen chars", "\x5E\x66ourteen chars"s},
+      {"fifteen letters", "\x5F\x10\x0F\x66ifteen letters"s},
       {"\xC3\xA9\xF0\x9F\x98\x80", "\x63\0\xE9\xD8\x3D\xDE\0"s},
       {Data(asBytes("\1\2\3")), "\x43\1\2\3"s},
       {Array::create(), "\xA0"s},
@@ -84,12 +75,7 @@ TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
 
 TEST(Binary, EqualScalarsAreOneObjectAndKeysAreSorted) {
   const Dictionary value{{"b", Array{1, std::int8_t{1}, "a", 1.0}}, {"a", 1}};
-  EXPECT_EQ(*writeBinary(value), document({"\xD2\1\3\2\4"s,
-                                           "\x51"
-                                           "a"s,
-                                           "\x10\1"s,
-                                           "\x51"
-                                           "b"s,
+  EXPECT_EQ(*writeBinary(value), document({"\xD2\1\3\2\4"s, "\x51\x61"s, "\x10\1"s, "\x51\x62"s,
                                            "\xA4\2\2\1\5"s, "\x23\x3F\xF0\0\0\0\0\0\0"s}));
 }
 
@@ -117,11 +103,8 @@ TEST(Binary, TextThatIsNotUnicodeIsRepaired) {
             Value(Dictionary{{"k\uFFFD", 1}, {"k\uFFFD2", 2}, {"\x01", 0}}));
 }
 
-TEST(Binary, RefusesToWriteNullAndCycles) {
-  EXPECT_EQ(writeBinary(Dictionary{{"a", Array{1, Value()}}}).error().message,
-            "cannot encode the property list, value /a/1: null has no encoding");
-  Dictionary cyclic;
-  cyclic.set("self", Dictionary{{"x", 1}});
+TEST(Binary, RefusesToWriteCycles) {
+  Dictionary cyclic{{"self", Dictionary{{"x", 1}}}};
   cyclic.dictionary("self").set("self", cyclic);
   EXPECT_EQ(writeBinary(cyclic).error().message,
             "cannot encode the property list: containers nest deeper than 128, or one contains "
@@ -138,29 +121,19 @@ TEST(Binary, HostileObjectsAreRefused) {
     std::vector<std::string> objects;
     std::string error;  // behind "offset "
   } rows[] = {
-      {{"\x00"s}, "8: marker 0x00 is of no type that is read"},
-      {{"\x80\1"s}, "8: marker 0x80 is of no type that is read"},
-      {{"\xC1\1"s}, "8: marker 0xc1 is of no type that is read"},
       {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of no type that is read"},
       {{"\x15"s}, "8: an integer of more than 16 bytes"},
-      {{"\x14\0\0\0\0\0\0\0\1\0\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
       {{"\x14\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\1\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
       {{"\x21\0\0"s}, "8: a real of neither 4 nor 8 bytes"},
       {{"\x11\1"s}, "8: the object does not end before the table of offsets"},
-      {{"\x53"
-        "ab"s},
-       "8: the object does not end before the table of offsets"},
       {{"\x62\0a\0"s}, "8: the object does not end before the table of offsets"},
-      {{"\x4F"s}, "8: the object does not end before the table of offsets"},
       {{"\x4F\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
        "8: the object does not end before the table of offsets"},
       {{"\x4F\x22\0\0\0\1"s}, "9: the length of an object is no integer of 1 to 8 bytes"},
-      {{"\xDF\x13\x80\0\0\0\0\0\0\1"s}, "8: the object does not end before the table of offsets"},
       {{"\xD1\1"s}, "8: the object does not end before the table of offsets"},
       {{"\x51\xE9"s}, "8: a byte of a text is not ASCII"},
       {{"\xA1\1"s}, "9: a reference to object 1, where there are 1"},
       {{"\xD1\1\1"s, "\x09"s}, "11: a key is no text"},
-      {{"\xA1\0"s}, "8: a container contains itself"},
       {{"\xA1\1"s, "\xD1\2\0"s, "\x51\x61"s}, "8: a container contains itself"},
       {expanding, "85: there are more than 1000000 values, after shared references are expanded"},
   };
@@ -188,16 +161,13 @@ TEST(Binary, HostileTrailersAreRefused) {
   } rows[] = {
       {0, "bplist15", "0: it does not begin with \"bplist00\""},
       {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},
-      {17, "\x09"s, "17: 9 is no width from 1 to 8 bytes"},
       {16, "\2"s, "18: the table of offsets has no room for 1 objects"},
       {18, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "18: the table of offsets has no room for 18446744073709551615 objects"},
       {26, "\0\0\0\0\0\0\0\1"s, "26: a reference to object 1, where there are 1"},
       {34, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "34: the table of offsets begins at 18446744073709551615, outside the document"},
-      {34, "\0\0\0\0\0\0\0\7"s, "34: the table of offsets begins at 7, outside the document"},
       {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"},
-      {9, "\x07"s, "9: object 0 stands at offset 7, outside the objects"},
   };
   for (const auto& row : rows) {
     std::string bytes = good;
@@ -233,8 +203,6 @@ TEST(Coding, RecognisesTheEncodingByContent) {
     EXPECT_EQ(*read, value);
   }
   EXPECT_EQ(coding.decode({}).error().message, "not a property list: the document is empty");
-  EXPECT_EQ(coding.decode(asBytes("{a = 1;}")).error().message,
-            "not a property list: it begins neither with \"bplist00\" nor with \"<\"");
   EXPECT_EQ(coding.decode(asBytes(" \n<html/>")).error().message,
             "XML property list, line 2, column 1: <html> is no element of property lists");
 }

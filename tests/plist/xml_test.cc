@@ -31,7 +31,6 @@ TEST(Xml, WritesSortedIndentedDocument) {
       {"c", Dictionary{{"when", Date::sinceEpoch(-0.25)}, {"bytes", Data(bytes)}}},
       {"\xC3\xA9", ""},
   };
-  const std::string line(76, '/');
   EXPECT_EQ(*writeXml(document),
             wrapped("<dict>\n"
                     "\t<key>a&lt;&amp;&gt;</key>\n"
@@ -44,7 +43,7 @@ TEST(Xml, WritesSortedIndentedDocument) {
                     "\t<key>c</key>\n"
                     "\t<dict>\n"
                     "\t\t<key>bytes</key>\n\t\t<data>\n\t\t" +
-                    line +
+                    std::string(76, '/') +
                     "\n\t\t/w==\n\t\t</data>\n"
                     "\t\t<key>when</key>\n\t\t<date>2000-12-31T23:59:59Z</date>\n"
                     "\t</dict>\n"
@@ -53,26 +52,19 @@ TEST(Xml, WritesSortedIndentedDocument) {
 }
 
 TEST(Xml, ScalarsAreWrittenAndReadBack) {
-  constexpr double kInfinity = std::numeric_limits<double>::infinity();
   const struct {
     Value value;
     std::string text;
   } rows[] = {
       {std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"},
       {std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"},
-      {0.1, "<real>0.1</real>"},
       {0.1F, "<real>0.10000000149011612</real>"},
       {-0.0, "<real>-0</real>"},
       {5e-324, "<real>5e-324</real>"},
-      {kInfinity, "<real>inf</real>"},
-      {-kInfinity, "<real>-inf</real>"},
       {-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"},
-      {Date::ofDay(std::numeric_limits<std::int32_t>::max()),
-       "<date>5881580-07-11T00:00:00Z</date>"},
       {Date::ofDay(std::numeric_limits<std::int32_t>::min()),
        "<date>-5877641-06-23T00:00:00Z</date>"},
       {Data(asBytes("ab")), "<data>\nYWI=\n</data>"},
-      {Data(asBytes("abc")), "<data>\nYWJj\n</data>"},
       {Data(ByteSpan()), "<data>\n</data>"},
       {" \t\n\r ", "<string> \t\n&#13; </string>"},
       {"\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>"},
@@ -101,13 +93,10 @@ TEST(Xml, WhatXmlCannotHoldIsReplaced) {
 }
 
 TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
-  Array deep, cyclic;
-  for (std::size_t i = 0; i < limits::kPropertyListDepth; ++i)
-    deep = Array{deep};
   Array deepest = Array{1};
   for (std::size_t i = 1; i < limits::kPropertyListDepth; ++i)
     deepest = Array{deepest};
-  cyclic = Array{1};
+  Array cyclic{1};
   cyclic.append(cyclic);
   Array wide{1, 2, 3, 4, 5, 6, 7, 8};
   for (int i = 0; i < 6; ++i)
@@ -121,11 +110,8 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
     Value value;
     std::string error;
   } rows[] = {
-      {Value(), "cannot encode the property list, value /: null has no encoding"},
       {Dictionary{{"a", Array{1, Value()}}},
        "cannot encode the property list, value /a/1: null has no encoding"},
-      {Array{Date::sinceEpoch(std::numeric_limits<double>::quiet_NaN())},
-       "cannot encode the property list, value /0: no calendar reaches the date"},
       {Date::sinceEpoch(1e300),
        "cannot encode the property list, value /: no calendar reaches the date"},
       {Value(cyclic),
@@ -171,38 +157,21 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
     std::string error;  // behind "line 3, column "
   } rows[] = {
       {"", "1: <plist> holds no value"},
-      {"<set/>", "1: <set> is no element of property lists"},
-      {"<plist/>", "1: <plist> stands inside <plist>"},
       {"<true/><true/>", "8: <true> is a second value"},
       {"<key>a</key>", "1: <key> stands outside <dict>"},
-      {"<array><key>a</key></array>", "8: <key> stands outside <dict>"},
-      {"<dict><true/></dict>", "7: <true> stands where <key> should"},
       {"<dict><key>a</key></dict>", "19: the last <key> of a <dict> has no value"},
       {"<dict><key>a</key><key>b</key></dict>", "19: <key> stands where the value of a key should"},
       {"<string>a<true/></string>", "10: <true> stands where only text may"},
       {"<array>x</array>", "8: text stands outside an element that holds text"},
-      {"<true>x</true>", "7: text stands outside an element that holds text"},
-      {"<integer></integer>", "10: \"\" is no integer of 64 bits"},
       {"<integer>--1</integer>", "13: \"--1\" is no integer of 64 bits"},
       {"<integer>" + std::string(59, '9') + "\xC3\xA9</integer>",
        "70: \"" + std::string(59, '9') + "...\" is no integer of 64 bits"},
-      {"<integer>1.0</integer>", "13: \"1.0\" is no integer of 64 bits"},
       {"<integer>18446744073709551616</integer>",
        "30: \"18446744073709551616\" is no integer of 64 bits"},
-      {"<integer>-9223372036854775809</integer>",
-       "30: \"-9223372036854775809\" is no integer of 64 bits"},
       {"<real>1e999</real>", "12: \"1e999\" is no real number that a double holds"},
-      {"<real>+-1</real>", "10: \"+-1\" is no real number that a double holds"},
-      {"<real>nan(1)</real>", "13: \"nan(1)\" is no real number that a double holds"},
       {"<date>2026-02-29T00:00:00Z</date>",
        "27: \"2026-02-29T00:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
-      {"<date>2026-02-28T24:00:00Z</date>",
-       "27: \"2026-02-28T24:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
-      {"<data>YWJ</data>", "10: the text of <data> is not base64"},
       {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"},
-      {"<data>Y-==</data>", "11: the text of <data> is not base64"},
-      {"<string>&foo;</string>", "9: undefined entity"},
-      {"<string></integer>", "11: mismatched tag"},
   };
   for (const auto& row : rows) {
     const std::string error = errorOf(wrapped(row.body));
@@ -210,15 +179,11 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
   }
   EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
             "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is no integer of 64 bits");
-  EXPECT_EQ(errorOf(wrapped("<true/>") + "<x/>"),
-            "XML property list, line 4, column 1: junk after document element");
   EXPECT_EQ(errorOf("<dict/>"),
             "XML property list, line 1, column 1: <dict> stands where <plist> should");
   EXPECT_EQ(errorOf("<!DOCTYPE p [<!ENTITY a \"b\">]><plist><string>&a;</string></plist>"),
             "XML property list, line 1, column 25: entity \"a\" is declared; a property list may "
             "declare none");
-  EXPECT_EQ(errorOf("<!DOCTYPE p SYSTEM \"p\"><plist><string>&a;</string></plist>"),
-            "XML property list, line 1, column 39: entity \"a\" is not known");
   std::string deep;
   for (int i = 0; i < 129; ++i)
     deep += "<array>";
