@@ -1,10 +1,9 @@
 // The report: summaries and histograms over packed values, whitelist look-ups, coarsening.
 #include <benchmark/benchmark.h>
-#include <unistd.h>
-
 #include <filesystem>
 #include <random>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 #include "platform/linux/linux_platform.h"
@@ -24,7 +23,8 @@ std::vector<double> randomValues(std::size_t count) {
   std::mt19937_64 generator(7);
   std::normal_distribution<double> distribution(100, 40);
   std::vector<double> values(count);
-  for (double& value : values) value = distribution(generator);
+  for (double& value : values)
+    value = distribution(generator);
   return values;
 }
 
@@ -121,7 +121,8 @@ BENCHMARK(prefixLookup)->Arg(10)->Arg(100)->Arg(1000)->Arg(10000);
 void coarsen(benchmark::State& state) {
   const plist::Dictionary options{{"bucket_interval", 10}, {"sig_fig", 2}};
   std::int64_t value = 1;
-  for (auto _ : state) benchmark::DoNotOptimize(coarsened(value++, options));
+  for (auto _ : state)
+    benchmark::DoNotOptimize(coarsened(value++, options));
 }
 BENCHMARK(coarsen);
 

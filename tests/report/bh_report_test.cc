@@ -1,8 +1,8 @@
-#include "config/persisted_state.h"
 #include "report/bh_report.h"
 
 #include <gtest/gtest.h>
 
+#include "config/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {
