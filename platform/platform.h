@@ -7,8 +7,10 @@
 #include "platform/application_registry.h"
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
+#include "platform/date_formatting.h"
 #include "platform/device_answers.h"
 #include "platform/digest.h"
+#include "platform/driver_registry.h"
 #include "platform/dynamic_loading.h"
 #include "platform/event_loop.h"
 #include "platform/files.h"
@@ -16,8 +18,11 @@
 #include "platform/named_service.h"
 #include "platform/notifications.h"
 #include "platform/preferences.h"
+#include "platform/process.h"
 #include "platform/process_state.h"
 #include "platform/property_list_coding.h"
+#include "platform/stack_snapshot.h"
+#include "platform/standard_streams.h"
 #include "platform/statistics_store.h"
 #include "platform/submission.h"
 #include "platform/system_controls.h"
@@ -30,8 +35,10 @@ struct Platform {
   PWApplicationWorkspace& applications;
   Clock& clock;
   CrashReporting& crashReporting;
+  DateFormatting& dateFormatting;
   DeviceAnswers& deviceAnswers;
   Digest& digest;
+  DriverRegistry& drivers;
   DynamicLoader& dynamicLoader;
   EventLoop& eventLoop;
   Files& files;
@@ -40,7 +47,10 @@ struct Platform {
   NamedServices& namedServices;
   Notifications& notifications;
   Preferences& preferences;
+  Process& process;
   PropertyListCoding& propertyLists;
+  StackSnapshots& stackSnapshots;
+  StandardStreams& standardStreams;
   StatisticsStore& statistics;
   SubmissionService& submission;
   SystemControls& systemControls;

@@ -11,13 +11,18 @@
 #include "platform/linux/file_submission.h"
 #include "platform/linux/linux_applications.h"
 #include "platform/linux/linux_clock.h"
+#include "platform/linux/linux_date_formatting.h"
 #include "platform/linux/linux_dynamic_loader.h"
 #include "platform/linux/linux_event_loop.h"
 #include "platform/linux/linux_files.h"
 #include "platform/linux/linux_locale.h"
+#include "platform/linux/linux_process.h"
+#include "platform/linux/linux_standard_streams.h"
 #include "platform/linux/linux_system_controls.h"
 #include "platform/linux/linux_system_log.h"
 #include "platform/linux/linux_system_version.h"
+#include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded_snapshots.h"
 #include "platform/linux/socket_service.h"
 #include "platform/linux/sqlite_store.h"
 #include "platform/plist/coding.h"
@@ -49,14 +54,21 @@ struct LinuxPlatform::Services {
   FileNotifications notifications{root, log};
   LinuxEventLoop eventLoop;
   SocketServices namedServices{eventLoop, root, log};
+  LinuxDateFormatting dateFormatting{root};
+  LinuxProcess process;
+  LinuxStandardStreams standardStreams;
+  RecordedRegistry drivers{root, layer, propertyLists, log};
+  RecordedSnapshots stackSnapshots{root, layer};
   ProcessState state;
 
   Platform platform{
       .applications = applications,
       .clock = clock,
       .crashReporting = crashReporting,
+      .dateFormatting = dateFormatting,
       .deviceAnswers = answers,
       .digest = digest,
+      .drivers = drivers,
       .dynamicLoader = dynamicLoader,
       .eventLoop = eventLoop,
       .files = files,
@@ -65,7 +77,10 @@ struct LinuxPlatform::Services {
       .namedServices = namedServices,
       .notifications = notifications,
       .preferences = preferences,
+      .process = process,
       .propertyLists = propertyLists,
+      .stackSnapshots = stackSnapshots,
+      .standardStreams = standardStreams,
       .statistics = store,
       .submission = submission,
       .systemControls = systemControls,

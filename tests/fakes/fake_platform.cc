@@ -33,6 +33,25 @@ class FakeHistory : public BHHistory {
   FakeStore& store_;
 };
 
+class FakeSnapshot : public StackSnapshot {
+ public:
+  explicit FakeSnapshot(FakeSnapshots& source) : source_(source) { ++source_.alive; }
+  ~FakeSnapshot() override { --source_.alive; }
+
+  bool setFlags(std::uint32_t flags) override {
+    source_.flags = flags;
+    return source_.takesFlags;
+  }
+  bool capture() override { return source_.captures; }
+  std::optional<ByteSpan> buffer() override {
+    if (!source_.hasBuffer) return std::nullopt;
+    return source_.content;
+  }
+
+ private:
+  FakeSnapshots& source_;
+};
+
 class StringLogFile : public LogFile {
  public:
   void write(ByteSpan bytes) override { content += asText(bytes); }
@@ -111,6 +130,10 @@ bool FakeSubmission::ZTXWriteLogForSubmission(std::string_view type, std::string
 void FakePlatform::setWhitelist(const plist::Dictionary& groups) {
   files.contents["/Library/Application Support/Brimhold/Whitelist_Pellio.plist"] =
       *propertyLists.encodeXml(groups);
+}
+
+std::unique_ptr<StackSnapshot> FakeSnapshots::create() {
+  return creates ? std::make_unique<FakeSnapshot>(*this) : nullptr;
 }
 
 }  // namespace tavrel::fakes

@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/text.h"
 #include "platform/platform.h"
 #include "platform/plist/coding.h"
 #include "tests/fakes/plist_matching.h"
@@ -276,6 +277,48 @@ struct FakeServices : NamedServices {
   std::unique_ptr<ServiceListener> createListener(std::string_view serviceName) override;
 };
 
+/// Dates in UTC, whatever the pattern.
+struct FakeDateFormatting : DateFormatting {
+  std::string format(plist::Date date, std::string_view, std::string_view) override {
+    return textOf(plist::Value(date));
+  }
+};
+
+struct FakeProcess : Process {
+  std::string name() override { return "tavrel"; }
+  std::int32_t identifier() override { return 211; }
+};
+
+/// What was printed.
+struct FakeStreams : StandardStreams {
+  std::string output, error;
+  void writeOutput(std::string_view text) override { output += text; }
+  void writeError(std::string_view text) override { error += text; }
+};
+
+/// No drivers, or those of the registry behind it.
+struct FakeRegistry : DriverRegistry {
+  DriverRegistry* behind = nullptr;
+
+  std::shared_ptr<DriverService> firstService(std::string_view className) override {
+    return behind ? behind->firstService(className) : nullptr;
+  }
+  KernelReturn matchingServices(const plist::Dictionary& matching,
+                                std::unique_ptr<ServiceIterator>& services) override {
+    return behind ? behind->matchingServices(matching, services) : kKernelNotFound;
+  }
+};
+
+/// Captures `content`; each step can be made to fail.
+struct FakeSnapshots : StackSnapshots {
+  std::vector<std::byte> content;
+  bool creates = true, takesFlags = true, captures = true, hasBuffer = true;
+  std::uint32_t flags = 0;
+  int alive = 0;  // configurations that were not released
+
+  std::unique_ptr<StackSnapshot> create() override;
+};
+
 /// All of them, and the `Platform` over them.
 struct FakePlatform {
   Journal journal;
@@ -297,12 +340,19 @@ struct FakePlatform {
   FakeSubmission submission{journal};
   FakeControls controls;
   FakeSystemVersion systemVersion;
+  FakeDateFormatting dateFormatting;
+  FakeRegistry drivers;
+  FakeProcess process;
+  FakeSnapshots stackSnapshots;
+  FakeStreams streams;
   ProcessState state;
   Platform platform{.applications = applications,
                     .clock = clock,
                     .crashReporting = crashReporting,
+                    .dateFormatting = dateFormatting,
                     .deviceAnswers = answers,
                     .digest = digest,
+                    .drivers = drivers,
                     .dynamicLoader = loader,
                     .eventLoop = eventLoop,
                     .files = files,
@@ -311,7 +361,10 @@ struct FakePlatform {
                     .namedServices = services,
                     .notifications = notifications,
                     .preferences = preferences,
+                    .process = process,
                     .propertyLists = propertyLists,
+                    .stackSnapshots = stackSnapshots,
+                    .standardStreams = streams,
                     .statistics = store,
                     .submission = submission,
                     .systemControls = controls,

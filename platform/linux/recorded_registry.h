@@ -1,0 +1,37 @@
+// The registry of drivers, played back from recordings.
+//
+// Linux has no such registry: what a device's drivers publish and answer is recorded as property
+// lists in /var/lib/tavrel/registry under the device root. docs/registry.md describes the format.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "base/plist.h"
+#include "platform/driver_registry.h"
+#include "platform/linux/device_root.h"
+#include "platform/linux/file_layer.h"
+#include "platform/property_list_coding.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class RecordedRegistry final : public DriverRegistry {
+ public:
+  /// Reads the folder when it is first asked for a service.
+  RecordedRegistry(const DeviceRoot& root, FileLayer& files, PropertyListCoding& propertyLists,
+                   SystemLog& log);
+  /// Plays one recording, in the form that a file of the folder has.
+  RecordedRegistry(const plist::Dictionary& recording, SystemLog& log);
+  ~RecordedRegistry() override;
+
+  std::shared_ptr<DriverService> firstService(std::string_view className) override;
+  KernelReturn matchingServices(const plist::Dictionary& matching,
+                                std::unique_ptr<ServiceIterator>& services) override;
+
+ private:
+  struct Recording;
+  std::unique_ptr<Recording> recording_;
+};
+
+}  // namespace tavrel
