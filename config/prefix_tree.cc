@@ -18,6 +18,7 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
   std::sort(prefixes_.begin(), prefixes_.end());
   prefixes_.erase(std::unique(prefixes_.begin(), prefixes_.end()), prefixes_.end());
   if (prefixes_.empty()) return;
+  shorter_.resize(prefixes_.size(), kNone);
   nodes_.emplace_back();
   branches_.push_back(0);
   build();
@@ -28,52 +29,63 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
 void PrefixTree::build() {
   struct Range {
     std::size_t node, begin, end;
+    std::uint32_t longest;  // the longest prefix above
   };
-  std::vector<Range> pending{{0, 0, prefixes_.size()}};
+  std::vector<Range> pending{{0, 0, prefixes_.size(), kNone}};
   while (!pending.empty()) {
-    const Range range = pending.back();
+    Range range = pending.back();
     pending.pop_back();
 
     // In sorted order the first and the last share what all share.
     const std::size_t depth = commonLength(prefixes_[range.begin], prefixes_[range.end - 1]);
-    const bool isPrefix = prefixes_[range.begin].size() == depth;
+    if (prefixes_[range.begin].size() == depth) {
+      shorter_[range.begin] = range.longest;
+      range.longest = static_cast<std::uint32_t>(range.begin++);
+    }
     const std::size_t firstChild = nodes_.size();
-    for (std::size_t at = range.begin + (isPrefix ? 1 : 0); at < range.end;) {
+    for (std::size_t at = range.begin; at < range.end;) {
       const char next = prefixes_[at][depth];
       std::size_t after = at + 1;
       while (after < range.end && prefixes_[after][depth] == next)
         ++after;
-      pending.push_back({nodes_.size(), at, after});
+      pending.push_back({nodes_.size(), at, after, range.longest});
       nodes_.emplace_back();
       branches_.push_back(next);
       at = after;
     }
-    nodes_[range.node] = {std::string_view(prefixes_[range.begin]).substr(0, depth),
+    nodes_[range.node] = {static_cast<std::uint32_t>(depth), range.longest,
                           static_cast<std::uint32_t>(firstChild),
-                          static_cast<std::uint16_t>(nodes_.size() - firstChild), isPrefix};
+                          static_cast<std::uint32_t>(nodes_.size() - firstChild)};
   }
 }
 
-const PrefixTree::Node* PrefixTree::childFor(const Node& node, char next) const {
-  if (node.childCount == 0) return nullptr;
+// The root, which is nobody's child, stands for none.
+std::size_t PrefixTree::childFor(const Node& node, char next) const {
+  if (node.childCount == 0) return 0;
   const char* branches = branches_.data() + node.firstChild;
   const void* found = std::memchr(branches, static_cast<unsigned char>(next), node.childCount);
-  if (!found) return nullptr;
-  return &nodes_[node.firstChild +
-                 static_cast<std::size_t>(static_cast<const char*>(found) - branches)];
+  if (!found) return 0;
+  return node.firstChild + static_cast<std::size_t>(static_cast<const char*>(found) - branches);
 }
 
 std::optional<std::string_view> PrefixTree::longestMatch(std::string_view key) const {
-  std::optional<std::string_view> longest;
-  std::size_t compared = 0;
-  for (const Node* node = nodes_.empty() ? nullptr : nodes_.data(); node;) {
-    if (!key.substr(compared).starts_with(node->text.substr(compared))) break;
-    if (node->isPrefix) longest = node->text;
-    compared = node->text.size();
-    if (key.size() == compared) break;
-    node = childFor(*node, key[compared]);
+  if (nodes_.empty()) return std::nullopt;
+  // The branches alone lead to the only node of which the key can begin with the most.
+  const Node* node = nodes_.data();
+  while (node->length < key.size()) {
+    const std::size_t child = childFor(*node, key[node->length]);
+    if (child == 0) break;
+    node = &nodes_[child];
   }
-  return longest;
+  std::uint32_t longest = node->longest;
+  if (longest == kNone) return std::nullopt;
+  // Mostly the key begins with it whole.
+  if (key.starts_with(prefixes_[longest])) return prefixes_[longest];
+  const std::size_t common = commonLength(key, prefixes_[longest]);
+  while (longest != kNone && prefixes_[longest].size() > common)
+    longest = shorter_[longest];
+  if (longest == kNone) return std::nullopt;
+  return prefixes_[longest];
 }
 
 }  // namespace tavrel

@@ -23,21 +23,25 @@ class PrefixTree {
   std::optional<std::string_view> longestMatch(std::string_view key) const;
 
  private:
+  static constexpr std::uint32_t kNone = 0xFFFF'FFFF;
+
   // A node stands for the text from the root to it, which is the beginning of all prefixes below
-  // it and borrowed from one of them. The children of a node lie side by side.
+  // it. The children of a node lie side by side. Nodes are small, since a walk goes from one to
+  // the next and looks at texts only at its end.
   struct Node {
-    std::string_view text;
+    std::uint32_t length;   // of the text
+    std::uint32_t longest;  // the longest prefix that the text begins with
     std::uint32_t firstChild;
-    std::uint16_t childCount;
-    bool isPrefix;  // the node's text is itself a prefix
+    std::uint32_t childCount;
   };
 
   void build();
-  const Node* childFor(const Node& node, char next) const;
+  std::size_t childFor(const Node& node, char next) const;
 
-  std::vector<std::string> prefixes_;  // sorted, each once
-  std::vector<Node> nodes_;            // the root first
-  std::vector<char> branches_;         // for each node the byte that leads to it
+  std::vector<std::string> prefixes_;   // sorted, each once
+  std::vector<std::uint32_t> shorter_;  // for each the longest other one that it begins with
+  std::vector<Node> nodes_;             // the root first
+  std::vector<char> branches_;          // for each node the byte that leads to it
 };
 
 }  // namespace tavrel

@@ -4,13 +4,15 @@
 // kept. A day is a number of days since 1970-01-01, UTC.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>
-#include <span>
 #include <string_view>
+#include <utility>
 
 #include "base/plist.h"
+#include "platform/distribution_record.h"
 
 namespace tavrel {
 
@@ -18,39 +20,49 @@ namespace tavrel {
 /// fetched from the store in blocks, and only when asked for.
 class BHHistoryDistributionEnumerator {
  public:
-  struct Sample {
-    double value;
-    std::uint32_t secondsInDayOffset;
-  };
+  using Sample = DistributionSample;
 
   virtual ~BHHistoryDistributionEnumerator() = default;
 
   /// True with the next value and its offset in seconds within the day; false when none is left.
   bool getNextValue(double& value, std::uint32_t& secondsInDayOffset) {
     if (next_ == end_) {
-      const auto block = nextBlock();
-      if (block.empty()) return false;
-      next_ = block.data();
-      end_ = next_ + block.size();
+      const std::string_view records = nextRecords();
+      if (records.empty()) return false;
+      next_ = records.data();
+      end_ = next_ + records.size();
     }
-    value = next_->value;
-    secondsInDayOffset = next_->secondsInDayOffset;
-    ++next_;
+    const Sample sample = distributionSampleAt(next_);
+    value = sample.value;
+    secondsInDayOffset = sample.secondsInDayOffset;
+    next_ += kDistributionRecordBytes;
     return true;
+  }
+
+  /// The packed records (platform/distribution_record.h) of the next values, for those who want
+  /// many at once; empty when none is left. They stay valid until more is asked for.
+  std::string_view nextRecords() {
+    if (next_ != end_) {
+      const char* const first = std::exchange(next_, end_);
+      return {first, static_cast<std::size_t>(end_ - first)};
+    }
+    const std::string_view block = nextBlock();
+    return block.substr(0, block.size() / kDistributionRecordBytes * kDistributionRecordBytes);
   }
 
   /// True when values are missing because they could not be read; the reason has been reported.
   bool failed() const { return failed_; }
 
  protected:
-  /// The next values, which stay valid until the next call; empty when none is left.
-  virtual std::span<const Sample> nextBlock() = 0;
+  /// The packed records of the next values, whole ones, which stay valid until the next call; empty
+  /// when none is left.
+  virtual std::string_view nextBlock() = 0;
   /// To be called before `nextBlock` yields nothing for a failure.
   void fail() { failed_ = true; }
 
  private:
-  const Sample* next_ = nullptr;
-  const Sample* end_ = nullptr;
+  const char* next_ = nullptr;
+  const char* end_ = nullptr;
   bool failed_ = false;
 };
 

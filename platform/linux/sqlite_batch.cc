@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "base/limits.h"
-#include "platform/linux/sqlite_chunk.h"
 #include "platform/linux/sqlite_schema.h"
 
 namespace tavrel {
@@ -150,8 +149,8 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
                                 std::uint32_t secondsInDayOffset, double value) {
   try {
     PendingSeries& series = pendingSeries({day, key});
-    appendChunkRecord(series.records, {value, secondsInDayOffset});
-    pendingBytes_ += kChunkRecordBytes;
+    appendDistributionRecord(series.records, {value, secondsInDayOffset});
+    pendingBytes_ += kDistributionRecordBytes;
     if (pendingBytes_ >= kPendingBytes) writeDistributions();
   } catch (const StoreFailure& failure) {
     return describe(failure);
@@ -219,14 +218,14 @@ void SqliteBatch::writeSeries(const SeriesName& name, std::string_view records) 
   sql.getSeries.reset();
   if (series < 0) series = newSeries();
 
-  const auto added = static_cast<std::int64_t>(records.size() / kChunkRecordBytes);
+  const auto added = static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
   if (added > kValuesPerSeries - count) {
     throw StoreFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
                                               " values of one day and takes no more: use another "
                                               "key"};
   }
 
-  constexpr std::size_t kFullChunk = kValuesPerChunk * kChunkRecordBytes;
+  constexpr std::size_t kFullChunk = kValuesPerChunk * kDistributionRecordBytes;
   std::int64_t chunk =
       (series << kChunkOrdinalBits) + count / static_cast<std::int64_t>(kValuesPerChunk);
   std::string filled;
@@ -234,7 +233,7 @@ void SqliteBatch::writeSeries(const SeriesName& name, std::string_view records) 
     sql.getChunk.bind(1, chunk);
     if (sql.getChunk.step()) filled = sql.getChunk.bytes(0);
     sql.getChunk.reset();
-    if (filled.size() != begun * kChunkRecordBytes) throwInconsistent();
+    if (filled.size() != begun * kDistributionRecordBytes) throwInconsistent();
   }
   for (std::string_view rest = records; !rest.empty(); ++chunk) {
     const std::size_t taken = std::min(rest.size(), kFullChunk - filled.size());

@@ -43,7 +43,8 @@ struct StoreFailure : std::exception {
 /// What can be done about a failure of the system; `otherwise` when its code tells nothing.
 const char* adviceFor(int systemCode, const char* otherwise);
 
-/// How long locks of other processes are waited for, all waits together.
+/// How long locks of other processes are waited for: one amount for all that share it, which the
+/// moments slept use up and nothing fills again. For one thread.
 class BusyBudget {
  public:
   explicit BusyBudget(int milliseconds) : left_(std::chrono::milliseconds(milliseconds)) {}

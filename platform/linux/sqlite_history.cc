@@ -4,10 +4,8 @@
 #include <limits>
 #include <string>
 #include <utility>
-#include <vector>
 
 #include "base/text.h"
-#include "platform/linux/sqlite_chunk.h"
 
 namespace tavrel {
 namespace {
@@ -33,9 +31,8 @@ StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreF
 
 class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  public:
-  ChunkEnumerator(SqliteStatement& chunks, std::vector<Sample>& samples, std::int64_t series,
-                  std::int64_t count)
-      : chunks_(chunks), samples_(samples), series_(series), count_(count) {}
+  ChunkEnumerator(SqliteStatement& chunks, std::int64_t series, std::int64_t count)
+      : chunks_(chunks), series_(series), count_(count) {}
   ~ChunkEnumerator() override {
     if (state_ == State::Reading) chunks_.reset();
   }
@@ -47,15 +44,17 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  private:
   enum class State : std::uint8_t { Unread, Reading, Ended };
 
-  std::span<const Sample> nextBlock() override {
+  std::string_view nextBlock() override {
     try {
       if (state_ == State::Unread) begin();
       if (state_ == State::Reading && chunks_.step()) {
-        if (!decodeChunk(chunks_.bytes(0), samples_)) {
+        const std::string_view records = chunks_.bytes(0);
+        if (records.empty() || records.size() % kDistributionRecordBytes != 0 ||
+            records.size() > kValuesPerChunk * kDistributionRecordBytes) {
           refuse("its values are not in the form that this program writes");
         }
-        read_ += static_cast<std::int64_t>(samples_.size());
-        if (read_ <= count_) return samples_;
+        read_ += static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
+        if (read_ <= count_) return records;
       }
       if (state_ == State::Reading && read_ != count_) {
         refuse("it does not hold the " + std::to_string(count_) + " values that it counts");
@@ -86,7 +85,6 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
   }
 
   SqliteStatement& chunks_;
-  std::vector<Sample>& samples_;
   std::int64_t series_;
   std::int64_t count_;
   std::int64_t read_ = 0;
@@ -249,7 +247,6 @@ void SqliteHistory::readDistributions(const Selection& selection,
                                                             store_sql::kDistributionsByKey,
                                                             store_sql::kDistributionsByDay));
   SqliteStatement chunks(store_->connection, store_sql::kChunks);
-  std::vector<BHHistoryDistributionEnumerator::Sample> samples;
   selection.bind(rows);
   bool stop = false;
   while (!stop && rows.step()) {
@@ -257,7 +254,7 @@ void SqliteHistory::readDistributions(const Selection& selection,
     if (!key.starts_with(selection.prefix)) break;
     const auto day = static_cast<std::int32_t>(rows.integer(1));
     const std::int64_t count = rows.integer(3);
-    ChunkEnumerator values(chunks, samples, rows.integer(2), count);
+    ChunkEnumerator values(chunks, rows.integer(2), count);
     rowHandler(key, day, count, values, stop);
     if (!values.failure()) continue;
     if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();

@@ -12,6 +12,13 @@ namespace {
 
 constexpr std::int64_t kSchemaVersion = 1;
 
+// Of a new store. Values are read as fast as the system hands out their pages, and that is twice as
+// fast by 64 KiB as by SQLite's 4 KiB. Commits, which write whole pages, are few.
+constexpr const char* kPageSize = "PRAGMA page_size = 65536";
+
+// The log is moved into the database when it is longer than 4 MiB, as with pages of 4 KiB.
+constexpr const char* kAutomaticCheckpoint = "PRAGMA wal_autocheckpoint = 64";
+
 // Keys are blobs: they are compared byte by byte and may hold any byte.
 constexpr const char* kSchema = R"(
 CREATE TABLE scalars (
@@ -92,6 +99,7 @@ SqliteConnection openStoreForWriting(const std::string& path,
     version = schemaVersion(connection);
     if (version == 0) {
       if (hasTables(connection)) refuseSchema(version);
+      connection.execute(kPageSize);
       connection.execute("PRAGMA journal_mode = WAL; BEGIN IMMEDIATE");
       connection.execute(kSchema);
       connection.execute("COMMIT");
@@ -102,6 +110,7 @@ SqliteConnection openStoreForWriting(const std::string& path,
   // Commits are few and hold a whole run's values, so each is flushed: what was said to be kept is
   // kept across a power cut too.
   connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
+  connection.execute(kAutomaticCheckpoint);
   return connection;
 }
 

@@ -2,6 +2,7 @@
 // the tables for those who read the file with other tools.
 #pragma once
 
+#include <cstddef>
 #include <memory>
 #include <optional>
 #include <string>
@@ -43,6 +44,10 @@ inline constexpr std::string_view kChunks =
 
 /// A chunk's number is its series' number and, in the low bits, its place in the series.
 inline constexpr int kChunkOrdinalBits = 20;
+
+/// Every chunk of a series but the last is full. 12 KiB: few enough bytes that one more value does
+/// not rewrite much, enough that a million values are read in a thousand steps; five fill a page.
+inline constexpr std::size_t kValuesPerChunk = 1024;
 
 /// Opens the store for writing and gives an empty file the schema. The folder must exist.
 SqliteConnection openStoreForWriting(const std::string& path,

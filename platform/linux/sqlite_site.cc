@@ -82,8 +82,8 @@ std::string StoreSite::describe(const StoreFailure& failure) const {
 }
 
 void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) const {
-  const bool lasts = failure.fault == StoreFault::Foreign || failure.fault == StoreFault::Damaged;
-  if (lasts && !told->insert(failure.message).second) return;
+  const bool passes = failure.fault == StoreFault::Busy || failure.fault == StoreFault::Other;
+  if (!passes && !told->insert(failure.message).second) return;
   log.write(LogLevel::Error, describe(failure).append(consequence));
 }
 

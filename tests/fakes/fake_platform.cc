@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <utility>
 
 namespace tavrel::fakes {
 namespace {
@@ -94,6 +95,13 @@ class FakeListener : public ServiceListener {
 }  // namespace
 
 SystemControls::Result FakeControls::read(std::string_view name, MutableByteSpan buffer) {
+  if (name == "kern.next_ecc_event") {
+    if (eccEvents.empty()) return {errorBehindEvents, 0};
+    const auto event = std::exchange(eccEvents.front(), {});
+    eccEvents.pop_front();
+    std::copy(event.begin(), event.end(), buffer.begin());
+    return {0, event.size()};
+  }
   const auto at = values.find(name);
   if (at == values.end()) return {ENOENT, 0};
   if (at->second.size() > buffer.size()) return {ENOMEM, 0};

@@ -73,14 +73,14 @@ struct FakePreferences : Preferences {
 struct FakeDistribution : BHHistoryDistributionEnumerator {
   explicit FakeDistribution(const std::vector<double>& values) {
     for (const double value : values)
-      samples.push_back({value, 0});
+      appendDistributionRecord(records, {value, 0});
   }
-  std::vector<Sample> samples;
+  std::string records;
   bool wasRead = false;
   bool fails = false;  // behind the values
 
-  std::span<const Sample> nextBlock() override {
-    if (!std::exchange(wasRead, true)) return samples;
+  std::string_view nextBlock() override {
+    if (!std::exchange(wasRead, true)) return records;
     if (fails) fail();
     return {};
   }
@@ -98,6 +98,7 @@ struct FakeStore : StatisticsStore {
   plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
   void BHClientCheckpoint() override { journal.push_back("checkpoint"); }
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
+    journal.push_back(format("scalar %s", key));
     scalars.emplace_back(key, today, value);
   }
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
@@ -237,9 +238,11 @@ struct FakeLocale : Locale {
   std::optional<std::string> countryCode() override { return country; }
 };
 
-/// Controls with a value; all others do not exist.
+/// Controls with a value, and the answers of "kern.next_ecc_event"; all others do not exist.
 struct FakeControls : SystemControls {
   std::map<std::string, std::vector<std::byte>, std::less<>> values;
+  std::deque<std::vector<std::byte>> eccEvents;
+  int errorBehindEvents = 2;  // no such entry
 
   Result read(std::string_view name, MutableByteSpan buffer) override;
 };

@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "config/persisted_state.h"
+#include "report/histogram.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {
@@ -109,8 +110,10 @@ TEST_F(BHReportTest, KeepsTheLaterRowOfADistribution) {
 
 TEST_F(BHReportTest, SummarisesWithoutAHistogramThatIsTooLarge) {
   Array boundaries = Array::create();
-  for (std::size_t i = 0; i <= limits::kHistogramBoundaries; ++i)
+  for (std::size_t i = 0; i < limits::kHistogramBoundaries; ++i)
     boundaries.append(i);
+  EXPECT_TRUE(Histogram::create(boundaries));
+  boundaries.append(0);
   BHReport report(fake.platform);
   fakes::FakeDistribution values({3});
   report.computeAndAddDistribution(values, "k", {{"intervals", boundaries}});

@@ -144,8 +144,7 @@ TEST_F(ProbesTest, CountMinutesOfUptime) {
 
 TEST_F(ProbesTest, ReadSystemControls) {
   const struct {
-    const char* key;
-    const char* control;
+    const char *key, *control;
     std::size_t length;
     std::int64_t ones;  // what all-ones bytes are reported as
     std::int64_t failure;
