@@ -9,6 +9,7 @@
 #include <utility>
 
 #include "platform/linux/file_preferences.h"
+#include "tools/typed_value.h"
 #include "tools/value_text.h"
 
 namespace tavrel {
@@ -51,6 +52,14 @@ class Findings {
     }
   }
 
+  /// Preferences are kept as XML.
+  void refuseOtherTexts(const plist::Value& value, const std::string& path) {
+    if (hasXmlTextsOnly(value)) return;
+    add(path,
+        "holds text that no preference can: property lists hold no control characters and only "
+        "UTF-8: give such bytes as data");
+  }
+
   std::vector<std::string> take() { return std::move(lines_); }
 
  private:
@@ -68,6 +77,8 @@ std::vector<std::string> checkTasking(const plist::Value& tasking) {
   }
   findings.refuseOtherKeys(dictionary, "", {"TaskingID", "TaskingDigest", "TaskingPayload"});
   findings.requireText(dictionary, "TaskingID", "TaskingID");
+  findings.refuseOtherTexts(dictionary.get("TaskingID"), "TaskingID");
+  findings.refuseOtherTexts(dictionary.get("TaskingDigest"), "TaskingDigest");
   const plist::Value payload = dictionary.get("TaskingPayload");
   if (payload && !payload.array()) {
     findings.add("TaskingPayload", "must be an array, not " + kindWithArticle(payload));
@@ -78,6 +89,7 @@ std::vector<std::string> checkTasking(const plist::Value& tasking) {
   const plist::Array array = payload.array();
   for (const plist::Value& element : array) {
     const std::string path = "TaskingPayload[" + std::to_string(index++) + "]";
+    findings.refuseOtherTexts(element, path);
     const plist::Dictionary setting = element.dictionary();
     if (!setting) {
       findings.add(path, "must be a dictionary, not " + kindWithArticle(element));

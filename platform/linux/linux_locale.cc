@@ -44,20 +44,6 @@ std::string_view unquoted(std::string_view value) {
   return value.substr(0, value.find_first_of(" \t#"));
 }
 
-/// False when the file is missing. One that is there but cannot be read is logged.
-template <class Use>
-bool readLines(const std::string& path, SystemLog& log, Use use) {
-  LineReader lines(path);
-  while (const auto line = lines.next()) {
-    const std::string_view text = trimmed(*line);
-    if (!text.empty() && !text.starts_with('#')) use(text);
-  }
-  const int code = lines.errorNumber();
-  if (code == ENOENT || code == ENOTDIR) return false;
-  if (code != 0) log.write(LogLevel::Error, systemError("read", path, code).message);
-  return true;
-}
-
 /// Languages in the order in which they are added, each once.
 class LanguageList {
  public:
@@ -90,12 +76,28 @@ std::string_view firstSet(const std::map<std::string, std::string, std::less<>>&
 
 }  // namespace
 
+bool LinuxLocale::readLines(std::string_view path,
+                            const std::function<void(std::string_view)>& use) {
+  const std::string file = root_.path(path);
+  LineReader lines(file);
+  while (const auto line = lines.next()) {
+    const std::string_view text = trimmed(*line);
+    if (!text.empty() && !text.starts_with('#')) use(text);
+  }
+  const int code = lines.errorNumber();
+  if (code == ENOENT || code == ENOTDIR) return false;
+  if (code != 0 && told_.insert(file).second) {
+    log_.write(LogLevel::Error, systemError("read", file, code).message);
+  }
+  return true;
+}
+
 LinuxLocale::Variables LinuxLocale::readVariables() {
   static constexpr std::string_view kNames[] = {"LANGUAGE", "LANG", "LC_ALL", "LC_MESSAGES",
                                                 "LC_MEASUREMENT"};
   Variables variables;
   for (const std::string_view path : kLocaleFiles) {
-    const bool present = readLines(root_.path(path), log_, [&](std::string_view line) {
+    const bool present = readLines(path, [&](std::string_view line) {
       if (line.starts_with("export ")) line = trimmed(line.substr(7));
       const std::size_t equals = line.find('=');
       if (equals == std::string_view::npos) return;
@@ -128,10 +130,9 @@ std::vector<std::string> LinuxLocale::preferredLanguages() {
 
 std::vector<std::string> LinuxLocale::systemLanguages() {
   LanguageList listed;
-  const std::string listPath = root_.path(kLanguagesFile);
-  const bool present = readLines(listPath, log_, [&](std::string_view line) {
+  const bool present = readLines(kLanguagesFile, [&](std::string_view line) {
     if (listed.addNamed(line)) return;
-    std::string message = listPath + ": ";
+    std::string message = root_.path(kLanguagesFile) + ": ";
     appendQuoted(message, line);
     message += " is no language; write one tag a line, such as de or pt-BR";
     log_.write(LogLevel::Error, message);
@@ -139,7 +140,7 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
   if (present) return listed.take();
 
   std::vector<std::string> generated;
-  readLines(root_.path(kGeneratedLocalesFile), log_, [&](std::string_view line) {
+  readLines(kGeneratedLocalesFile, [&](std::string_view line) {
     generated.emplace_back(line.substr(0, line.find_first_of(kBlank)));
   });
   std::error_code error;

@@ -11,7 +11,9 @@
 //   /etc/locale.gen and the folders in /usr/lib/locale. Without any, "en" and the preferred ones.
 #pragma once
 
+#include <functional>
 #include <map>
+#include <set>
 
 #include "platform/linux/device_root.h"
 #include "platform/locale.h"
@@ -34,8 +36,13 @@ class LinuxLocale final : public Locale {
   using Variables = std::map<std::string, std::string, std::less<>>;
   Variables readVariables();
 
+  /// Calls `use` with each line that says something. False when the file is missing; one that is
+  /// there but cannot be read is logged, once.
+  bool readLines(std::string_view path, const std::function<void(std::string_view line)>& use);
+
   const DeviceRoot& root_;
   SystemLog& log_;
+  std::set<std::string> told_;
 };
 
 }  // namespace tavrel

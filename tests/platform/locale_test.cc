@@ -1,6 +1,6 @@
 #include "platform/locale.h"
 
-#include <gtest/gtest.h>
+#include <sys/stat.h>
 
 #include "base/limits.h"
 #include "platform/linux/language_matching.h"
@@ -44,9 +44,7 @@ TEST(LanguageTag, ReadsTagsAndNamesOfLocales) {
 
 TEST(LanguageMatching, PrefersRegionThenParentThenLanguageAndNeverCrossesScripts) {
   struct Case {
-    Names available;
-    Names preferred;
-    Names matches;
+    Names available, preferred, matches;
   };
   const Case cases[] = {
       {{"en", "de", "de-AT"}, {"de-AT"}, {"de-AT", "de"}},
@@ -117,6 +115,13 @@ TEST_F(LocaleTest, ListsTheLanguagesOfTheSystem) {
   device.write("/etc/locale.gen", "zh_TW BIG5\n de_DE.UTF-8 UTF-8\nde_DE ISO-8859-1\n");
   device.write("/usr/lib/locale/fr_FR.utf8/LC_TIME", "");
   EXPECT_EQ(locale.systemLanguages(), (Names{"en", "de-DE", "fr-FR", "zh-TW"}));
+
+  std::filesystem::remove(device.root.path("/etc/locale.conf"));
+  ASSERT_EQ(mkfifo(device.root.path("/etc/locale.conf").c_str(), 0600), 0);
+  EXPECT_EQ(locale.preferredLanguages(), Names{});
+  EXPECT_EQ(locale.countryCode(), std::nullopt);
+  EXPECT_EQ(log.lines.size(), 1U) << "told once, and never waited for";
+  log.lines.clear();
 
   device.write("/etc/tavrel/languages", "# screens\nde\n\nzh_TW\nno language\n");
   EXPECT_EQ(locale.systemLanguages(), (Names{"de", "zh-TW"}));

@@ -1,99 +1,64 @@
-#include <CLI/CLI.hpp>
-#include <filesystem>
-#include <fstream>
-#include <gtest/gtest.h>
-#include <sstream>
-#include <stdlib.h>
-
+// tavrelctl tasking
+#include "device.h"
 #include "platform/linux/linux_platform.h"
-#include "platform/platform.h"
-#include "tools/tasking_commands.h"
 
 namespace tavrel {
 namespace {
 
 constexpr std::string_view kApplied = "com.norvane.tallied.tavrel";
 
-class TaskingTest : public testing::Test {
- protected:
-  void SetUp() override {
-    root = testing::TempDir() + "tavrel-tasking-XXXXXX";
-    ASSERT_NE(mkdtemp(root.data()), nullptr);
-    std::filesystem::create_directories(root + "/etc/tavrel");
-    std::ofstream(root + "/etc/tavrel/system-version.plist")
-        << "<plist version=\"1.0\"><dict><key>ProductBuildVersion</key><string>B1</string></dict>"
-           "</plist>";
+struct TaskingTest : testing::Test {
+  TaskingTest() {
+    device.write("/etc/tavrel/system-version.plist", xmlOf(R"({"ProductBuildVersion": "B1"})"));
   }
-  void TearDown() override { std::filesystem::remove_all(root); }
-
-  /// Runs one command line as a process of its own would; yields its exit status.
-  int run(std::vector<std::string> arguments, const std::string& input = {}) {
-    std::istringstream in(input);
-    std::ostringstream outStream;
-    std::ostringstream errorStream;
-    ToolContext context({in, outStream, errorStream});
-    context.setRoot(root);
-    CLI::App app;
-    addTaskingCommands(app, context);
-    app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
-    out = outStream.str();
-    error = errorStream.str();
-    return context.exitStatus();
+  Outcome run(std::vector<std::string> arguments, const std::string& input = {}) {
+    arguments.insert(arguments.begin(), "tasking");
+    return device.run(std::move(arguments), input);
   }
 
-  std::string root;
-  std::string out;
-  std::string error;
+  TemporaryDevice device;
 };
 
 TEST_F(TaskingTest, SchedulesShowsAndClears) {
-  EXPECT_EQ(run({"tasking", "show"}), kExitSuccess);
-  EXPECT_EQ(out,
-            "Scheduled tasking: none\nApplied tasking: none\nLast OS update: none seen\n"
-            "The next daily run changes nothing.\n");
-  EXPECT_EQ(run({"tasking", "clear"}), kExitSuccess);
-  EXPECT_EQ(out, "No tasking is scheduled.\n");
+  EXPECT_EQ(run({"show"}),
+            prints("Scheduled tasking: none\nApplied tasking: none\nLast OS update: none seen\n"
+                   "The next daily run changes nothing.\n"));
+  EXPECT_EQ(run({"clear"}), prints("No tasking is scheduled.\n"));
 
-  EXPECT_EQ(run({"tasking", "schedule", "-"},
+  EXPECT_EQ(run({"schedule", "-"},
                 R"({"TaskingID": "t1", "TaskingDigest": 7, "TaskingPayload": [
                   {"Domain": "com.norvane.da", "Key": "AggressiveSubmissionDays", "Value": 3},
                   {"Domain": "d", "Key": "k", "Value": "x\n"}]})"),
-            kExitSuccess)
-      << error;
-  EXPECT_EQ(out,
-            "Scheduled tasking t1 with 2 settings. The next daily run applies the scheduled "
-            "tasking.\n");
+            prints("Scheduled tasking t1 with 2 settings. The next daily run applies the scheduled "
+                   "tasking.\n"));
 
   {
-    LinuxPlatform device{DeviceRoot(root)};
-    Preferences& preferences = device.platform().preferences;
+    LinuxPlatform linuxPlatform{DeviceRoot(device.path(""))};
+    Preferences& preferences = linuxPlatform.platform().preferences;
     preferences.ZTXPreferencesSetValue("TaskingID", "t1", kApplied);
     preferences.ZTXPreferencesSetValue("TaskingOS", "B1", kApplied);
     preferences.ZTXPreferencesSetValue(
         "LastOSUpdate", plist::Dictionary{{"version", "B1"}, {"day", 20000}}, kApplied);
   }
-  EXPECT_EQ(run({"tasking", "show"}), kExitSuccess);
-  EXPECT_EQ(out,
-            "Scheduled tasking: t1\n  digest: 7\n  settings: 2\n"
-            "    DOMAIN          KEY                       VALUE\n"
-            "    com.norvane.da  AggressiveSubmissionDays  3\n"
-            "    d               k                         \"x\\n\"\n"
-            "Applied tasking: t1\n  OS build: B1\n  digest: -\n  settings: none\n"
-            "Last OS update: B1, first seen on day 20000\n"
-            "The next daily run changes nothing.\n");
+  EXPECT_EQ(run({"show"}),
+            prints("Scheduled tasking: t1\n  digest: 7\n  settings: 2\n"
+                   "    DOMAIN          KEY                       VALUE\n"
+                   "    com.norvane.da  AggressiveSubmissionDays  3\n"
+                   "    d               k                         \"x\\n\"\n"
+                   "Applied tasking: t1\n  OS build: B1\n  digest: -\n  settings: none\n"
+                   "Last OS update: B1, first seen on day 20000\n"
+                   "The next daily run changes nothing.\n"));
 
-  EXPECT_EQ(run({"tasking", "schedule", "-"}, R"({"TaskingID": "t2"})"), kExitSuccess);
-  EXPECT_EQ(run({"tasking", "show", "--json"}), kExitSuccess);
-  EXPECT_EQ(Json::parse(out), Json::parse(R"({"format_version": 1,
+  EXPECT_EQ(run({"schedule", "-"}, R"({"TaskingID": "t2"})").status, 0);
+  EXPECT_EQ(Json::parse(run({"show", "--json"}).out), Json::parse(R"({"format_version": 1,
     "scheduled": {"TaskingID": "t2", "TaskingDigest": null, "TaskingPayload": null},
     "applied": {"TaskingID": "t1", "TaskingOS": "B1", "TaskingDigest": null,
                 "TaskingPayload": null},
     "LastOSUpdate": {"day": 20000, "version": "B1"},
     "next_run": "takes the applied tasking back and applies the scheduled one"})"));
-  EXPECT_EQ(run({"tasking", "clear"}), kExitSuccess);
-  EXPECT_EQ(out, "Removed scheduled tasking t2. Settings that were applied stay in force.\n");
-  EXPECT_EQ(run({"tasking", "show"}), kExitSuccess);
-  EXPECT_EQ(out.substr(0, out.find('\n')), "Scheduled tasking: none");
+  EXPECT_EQ(run({"clear"}),
+            prints("Removed scheduled tasking t2. Settings that were applied stay in force.\n"));
+  EXPECT_TRUE(run({"show"}).out.starts_with("Scheduled tasking: none\n"));
 }
 
 TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
@@ -117,20 +82,19 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
         "TaskingPayload[2]/value: has no meaning; a device knows Domain, Key, Value",
         "TaskingPayload[2]/Domain: is missing", "TaskingPayload[2]/Value: is missing",
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
+      {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
+       {"TaskingPayload[0]: holds text that no preference can: property lists hold no control "
+        "characters and only UTF-8: give such bytes as data"}},
   };
   for (const Case& row : cases) {
-    EXPECT_EQ(run({"tasking", "schedule", "-"}, row.document), kExitFailure) << row.document;
     std::string lines;
-    for (const std::string& finding : row.findings) {
+    for (const std::string& finding : row.findings)
       lines += "tavrelctl: standard input: " + finding + "\n";
-    }
-    EXPECT_EQ(error, lines) << row.document;
-    EXPECT_EQ(out, "");
+    EXPECT_EQ(run({"schedule", "-"}, row.document), (Outcome{1, "", lines}));
   }
-  EXPECT_EQ(run({"tasking", "schedule", root + "/none"}), kExitFailure);
-  EXPECT_NE(error.find(root + "/none: No such file or directory"), std::string::npos) << error;
-  EXPECT_EQ(run({"tasking", "show"}), kExitSuccess);
-  EXPECT_EQ(out.substr(0, out.find('\n')), "Scheduled tasking: none");
+  const std::string none = device.path("/none");
+  EXPECT_EQ(run({"schedule", none}), fails("cannot read " + none + ": No such file or directory"));
+  EXPECT_TRUE(run({"show"}).out.starts_with("Scheduled tasking: none\n"));
 }
 
 }  // namespace
