@@ -2,36 +2,22 @@
 
 #include <algorithm>
 #include <array>
+#include <utility>
 
-#include "base/civil_time.h"
 #include "base/limits.h"
 #include "base/uuid.h"
 #include "platform/linux/digests.h"
 #include "platform/linux/guarded_end.h"
 #include "platform/linux/json_line.h"
 #include "platform/linux/random.h"
+#include "platform/linux/record_files.h"
 #include "platform/linux/stamp.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kRecordFolder = "/var/mobile/Library/Logs/CrashReporter/StructuredData";
-constexpr std::string_view kRecordEnding = ".jsonl";
 constexpr std::string_view kSupportLog = "/var/mobile/Library/Logs/NorvaneCare/support.log";
 constexpr mode_t kRecordMode = 0640;
-
-/// The day in the name of a record file; nothing for other files.
-std::optional<std::int64_t> dayOfRecordFile(std::string_view file) {
-  if (!file.ends_with(kRecordEnding)) return std::nullopt;
-  file.remove_suffix(kRecordEnding.size());
-  const std::size_t dash = file.find('-');
-  if (dash == 0 || dash == std::string_view::npos || file.find_first_not_of("0123456789") != dash) {
-    return std::nullopt;
-  }
-  const auto date = parseDate(file.substr(dash + 1));
-  if (!date) return std::nullopt;
-  return daysFromCivil(*date);
-}
 
 bool isFilled(const std::string& path) {
   const auto status = FileLayer::status(path);
@@ -47,53 +33,79 @@ FileCrashReporting::~FileCrashReporting() {
 void FileCrashReporting::FLLogStructuredData(std::uint32_t logType,
                                              const plist::Dictionary& record) {
   const plist::Date now = clock_.now();
+  RecordFile& records = recordFile(logType, dayOf(now));
+  if (!records.file) return;
+
   std::string line = "{\"time\":\"" + preciseStamp(now) + "\",\"type\":";
   line += std::to_string(logType);
   line += ",\"record\":";
   appendJson(line, record);
   line += "}\n";
-
-  std::string path = root_.path(kRecordFolder);
-  path += '/';
-  path += std::to_string(logType);
-  path += '-';
-  path += dateText(civilFromDays(dayOf(now)));
-  path += kRecordEnding;
-  const Status appended =
-      files_.append(path, asBytes(line), kRecordMode, limits::kStructuredRecordFileBytes);
-  if (appended) {
-    unflushed_.insert(std::move(path));
-  } else if (refused_.insert(std::move(path)).second) {
+  const Status appended = records.file->append(asBytes(line), limits::kStructuredRecordFileBytes);
+  if (!appended && !std::exchange(records.isRefusalTold, true)) {
     log_.log(LogLevel::Error, "structured records of type %u are dropped: %s", logType,
              appended.error().message);
   }
 }
 
-void FileCrashReporting::FLDumpAllOldStructuredDataLogs() {
-  flushRecords();
-  const std::string folder = root_.path(kRecordFolder);
-  const auto files = files_.list(folder);
+// One that cannot be opened is not tried again for each record of a run: its lock is waited for.
+FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t type,
+                                                               std::int64_t day) {
+  const auto known = recordFiles_.find(type);
+  if (known != recordFiles_.end() && known->second.day == day) return known->second;
+  if (known != recordFiles_.end()) flush(known->second);
+
+  RecordFile& records = recordFiles_[type] = {day, {}, false};
+  std::string path = root_.path(kRecordFolder);
+  path += '/';
+  path += recordFileName({type, day});
+  auto file = files_.openToAppend(path, kRecordMode);
+  if (file) {
+    records.file = *std::move(file);
+  } else {
+    log_.log(LogLevel::Error, "structured records of type %u are dropped: %s", type,
+             file.error().message);
+  }
+  return records;
+}
+
+std::vector<std::string> FileCrashReporting::oldRecordFiles() {
+  auto files = files_.list(root_.path(kRecordFolder));
   if (!files) {
     log_.write(LogLevel::Error, files.error().message);
-    return;
+    return {};
   }
   const std::int64_t today = dayOf(clock_.now());
-  for (const std::string& file : *files) {
-    const auto day = dayOfRecordFile(file);
-    if (!day || *day >= today - kDaysKept) continue;
-    if (Status removed = files_.remove(folder + "/" + file); !removed) {
+  std::erase_if(*files, [today](const std::string& name) {
+    const auto file = parseRecordFileName(name);
+    return !file || file->day >= today - kDaysKept;
+  });
+  return *std::move(files);
+}
+
+void FileCrashReporting::FLDumpAllOldStructuredDataLogs() {
+  flushRecords();
+  for (const std::string& name : oldRecordFiles()) {
+    std::string path = root_.path(kRecordFolder);
+    path += '/';
+    path += name;
+    if (Status removed = files_.remove(path); !removed) {
       log_.write(LogLevel::Error, removed.error().message);
     }
   }
 }
 
-void FileCrashReporting::flushRecords() {
-  for (const std::string& path : unflushed_) {
-    if (Status flushed = files_.flush(path); !flushed) {
-      log_.write(LogLevel::Error, flushed.error().message);
-    }
+void FileCrashReporting::flush(RecordFile& records) {
+  if (!records.file) return;
+  if (Status flushed = records.file->flush(); !flushed) {
+    log_.write(LogLevel::Error, flushed.error().message);
   }
-  unflushed_.clear();
+}
+
+void FileCrashReporting::flushRecords() {
+  for (auto& [type, records] : recordFiles_)
+    flush(records);
+  recordFiles_.clear();
 }
 
 // Only the logs below the first free number move. So a roll that was cut short, which leaves such a

@@ -2,13 +2,17 @@
 //
 // Structured records are lines of JSON in
 // /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
-// and day. They are written through to storage together, at the clean-up that ends a day's work or
-// with the process. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/
+// and day. Each is with the kernel when its call returns; they are written through to storage
+// together, at the clean-up that ends a day's work or with the process. Until then their files are
+// locked. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/
 // support.log, is rolled to support.log.1 and on to support.log.5.
 #pragma once
 
-#include <set>
+#include <cstdint>
+#include <map>
+#include <optional>
 #include <string>
+#include <vector>
 
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
@@ -35,6 +39,9 @@ class FileCrashReporting final : public CrashReporting {
   void FLDumpAllOldStructuredDataLogs() override;
   void rollNorvaneCareLogs() override;
 
+  /// The files that the clean-up removes, without their folder.
+  std::vector<std::string> oldRecordFiles();
+
   /// Derived from the machine's identifier, which itself never leaves the device: a UUID that is
   /// the same at every call; "unknown" on a machine without one.
   std::string systemIdentifier() override;
@@ -44,6 +51,14 @@ class FileCrashReporting final : public CrashReporting {
   std::string incidentIdentifier() override;
 
  private:
+  struct RecordFile {
+    std::int64_t day;
+    std::optional<AppendedFile> file;  // nothing when it cannot be used
+    bool isRefusalTold = false;
+  };
+
+  RecordFile& recordFile(std::uint32_t type, std::int64_t day);
+  void flush(RecordFile& file);
   void flushRecords();
   std::string fact(std::string_view devicePath);
 
@@ -52,8 +67,7 @@ class FileCrashReporting final : public CrashReporting {
   LinuxSystemVersion& systemVersion_;
   Clock& clock_;
   SystemLog& log_;
-  std::set<std::string> unflushed_;
-  std::set<std::string> refused_;  // files whose failure has been told
+  std::map<std::uint32_t, RecordFile> recordFiles_;  // by type
 };
 
 }  // namespace tavrel

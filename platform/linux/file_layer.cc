@@ -94,6 +94,38 @@ Status NewFile::commit() {
   return layer_.syncFolderOf(path_);
 }
 
+// -- Files that grow ------------------------------------------------------------------------------
+
+Status AppendedFile::append(ByteSpan bytes, std::size_t largest) {
+  std::string line;
+  char last = '\n';
+  if (size_ > 0 && !isLineEnded_ &&
+      pread(descriptor_.get(), &last, 1, static_cast<off_t>(size_ - 1)) == 1 && last != '\n') {
+    line = '\n';
+    line += asText(bytes);
+    bytes = asBytes(line);
+  }
+  if (bytes.size() > largest || size_ > largest - bytes.size()) {
+    return Error{"cannot append to " + path_ + ": it may have " + std::to_string(largest) +
+                 " bytes"};
+  }
+  if (Status written = layer_->writeAll(descriptor_.get(), bytes, path_); !written) {
+    layer_->truncateFile(descriptor_.get(), static_cast<off_t>(size_));
+    struct stat status {};
+    if (fstat(descriptor_.get(), &status) == 0) size_ = static_cast<std::uint64_t>(status.st_size);
+    isLineEnded_ = false;
+    return written;
+  }
+  size_ += bytes.size();
+  isLineEnded_ = !bytes.empty() && bytes.back() == std::byte{'\n'};
+  return Done{};
+}
+
+Status AppendedFile::flush() {
+  if (layer_->syncFile(descriptor_.get()) != 0) return systemError("flush", path_);
+  return layer_->syncFolderOf(path_);
+}
+
 // -- Reading ------------------------------------------------------------------------------------
 
 Expected<std::optional<std::string>> FileLayer::readIfPresent(const std::string& path,
@@ -216,38 +248,15 @@ Expected<Descriptor> FileLayer::openOrMake(const std::string& path, int flags, m
   return descriptor;
 }
 
-Status FileLayer::append(const std::string& path, ByteSpan bytes, mode_t mode,
-                         std::size_t largest) {
-  const Expected<Descriptor> descriptor = openOrMake(path, O_RDWR | O_APPEND, mode);
+Expected<AppendedFile> FileLayer::openToAppend(const std::string& path, mode_t mode) {
+  Expected<Descriptor> descriptor = openOrMake(path, O_RDWR | O_APPEND, mode);
   if (!descriptor) return descriptor.error();
-  if (Status locked = lock(descriptor->get(), path); !locked) return locked;
+  if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
   struct stat status {};
   if (fstat(descriptor->get(), &status) != 0) return systemError("write", path);
   if (!S_ISREG(status.st_mode)) return notRegular(path, status.st_mode);
-  const auto size = static_cast<std::uint64_t>(status.st_size);
-  if (bytes.size() + 1 > largest || size > largest - bytes.size() - 1) {
-    return Error{"cannot append to " + path + ": it may have " + std::to_string(largest) +
-                 " bytes"};
-  }
-
-  std::string line;
-  char last = '\n';
-  if (size > 0 && pread(descriptor->get(), &last, 1, status.st_size - 1) == 1 && last != '\n') {
-    line = '\n';
-    line += asText(bytes);
-    bytes = asBytes(line);
-  }
-  if (Status written = writeAll(descriptor->get(), bytes, path); !written) {
-    truncateFile(descriptor->get(), status.st_size);
-    return written;
-  }
-  return Done{};
-}
-
-Status FileLayer::flush(const std::string& path) {
-  const Descriptor descriptor(openFile(path.c_str(), O_RDONLY | kOpenSafely, 0));
-  if (!descriptor || syncFile(descriptor.get()) != 0) return systemError("flush", path);
-  return syncFolderOf(path);
+  return AppendedFile(*this, path, *std::move(descriptor),
+                      static_cast<std::uint64_t>(status.st_size));
 }
 
 Status FileLayer::rename(const std::string& from, const std::string& to) {

@@ -18,12 +18,14 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <optional>
 #include <set>
 #include <string>
 #include <string_view>
 #include <sys/stat.h>
 #include <sys/types.h>
+#include <utility>
 #include <vector>
 
 #include "base/bytes.h"
@@ -60,6 +62,29 @@ class NewFile {
   bool flushed_ = false;
 };
 
+/// A file that grows by whole entries. It is locked until the handle is released, so that whoever
+/// appends in the same way waits; reading goes on.
+class AppendedFile {
+ public:
+  /// Appends `bytes` in one write, which survives the end of the process but not of the power. When
+  /// they do not fit, nothing of them is left. A last line that a power cut left without its end
+  /// gets one first. Nothing is appended beyond `largest` bytes.
+  Status append(ByteSpan bytes, std::size_t largest);
+  /// Writes the file and its name through to storage.
+  Status flush();
+
+ private:
+  friend class FileLayer;
+  AppendedFile(FileLayer& layer, std::string path, Descriptor descriptor, std::uint64_t size)
+      : layer_(&layer), path_(std::move(path)), descriptor_(std::move(descriptor)), size_(size) {}
+
+  FileLayer* layer_;
+  std::string path_;
+  Descriptor descriptor_;
+  std::uint64_t size_;
+  bool isLineEnded_ = false;  // known to be; else to be looked at
+};
+
 class FileLayer {
  public:
   FileLayer() = default;
@@ -80,12 +105,9 @@ class FileLayer {
   /// A file that exists keeps its mode and owner; `mode` is for a new one.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Appends `bytes` in one write under the file's lock; the file is made when missing. When they
-  /// do not fit, nothing of them is left. A last line that a power cut left without its end gets
-  /// one first. Nothing is appended beyond `largest` bytes. Not flushed: see `flush`.
-  Status append(const std::string& path, ByteSpan bytes, mode_t mode, std::size_t largest);
-  /// Writes a file and its name through to storage.
-  Status flush(const std::string& path);
+  /// Opens a file to append to it; it and its folder are made when missing. Waits for another
+  /// process at most `limits::kFileLockMilliseconds`.
+  Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
   Status rename(const std::string& from, const std::string& to);
@@ -117,6 +139,7 @@ class FileLayer {
   virtual int makeFolder(const char* path, mode_t mode);
 
  private:
+  friend class AppendedFile;
   friend class NewFile;
   Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
   Status lock(int descriptor, const std::string& path);

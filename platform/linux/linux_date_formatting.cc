@@ -22,6 +22,11 @@ std::int64_t offsetAt(std::int64_t seconds, const std::string& zoneFile) {
   return ::localtime_r(&instant, &local) ? local.tm_gmtoff : 0;
 }
 
+// The year before year 1 is year 1 of the era before.
+std::int64_t yearOfEra(std::int64_t year) {
+  return year > 0 ? year : 1 - year;
+}
+
 }  // namespace
 
 std::string LinuxDateFormatting::format(plist::Date date, std::string_view pattern,
@@ -35,7 +40,7 @@ std::string LinuxDateFormatting::format(plist::Date date, std::string_view patte
     const std::size_t end = pattern.find_first_not_of(pattern.front());
     const std::string_view field = pattern.substr(0, end);
     if (field == "yyyy") {
-      appendFormat(text, "%04lld", time.date.year);
+      appendFormat(text, "%04lld", yearOfEra(time.date.year));
     } else if (field == "MM") {
       appendFormat(text, "%02u", time.date.month);
     } else if (field == "dd") {
@@ -47,8 +52,8 @@ std::string LinuxDateFormatting::format(plist::Date date, std::string_view patte
     } else if (field == "ss") {
       appendFormat(text, "%02u", time.second);
     } else if (field == "Z") {
-      const std::int64_t minutes = std::abs(offset) / 60;
-      appendFormat(text, "%s%02lld%02lld", offset < 0 ? "-" : "+", minutes / 60, minutes % 60);
+      const std::int64_t minutes = std::abs(offset / 60);
+      appendFormat(text, "%s%02lld%02lld", offset <= -60 ? "-" : "+", minutes / 60, minutes % 60);
     } else {
       text += field;
     }

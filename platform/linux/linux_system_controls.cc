@@ -64,6 +64,7 @@ SystemControls::Result LinuxSystemControls::read(std::string_view name, MutableB
   if (!recorded_) recorded_ = readDictionaryFile(files_, propertyLists_, log_, root_.path(kPath));
   if (const plist::Value recorded = recorded_->get(name)) return answer(name, recorded, buffer);
   if (name == "vm.swapusage") return swapUsage(buffer);
+  if (name == "kern.next_ecc_event") return eccEvents_.next(buffer);
   return {ENOENT, 0};
 }
 

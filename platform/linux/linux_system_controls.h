@@ -2,7 +2,8 @@
 //
 // What /etc/tavrel/system-controls.plist under the device root tells about a name comes first, read
 // once: bytes as they are, an integer in little-endian order over the whole buffer, or a failure as
-// {"errno": NUMBER}. "vm.swapusage" is otherwise answered from the kernel. Other names do not exist
+// {"errno": NUMBER}. "vm.swapusage" is otherwise answered from the kernel, and
+// "kern.next_ecc_event" from the queue of platform/linux/ecc_events.h. Other names do not exist
 // (ENOENT).
 #pragma once
 
@@ -13,6 +14,7 @@
 #include <string_view>
 
 #include "platform/linux/device_root.h"
+#include "platform/linux/ecc_events.h"
 #include "platform/linux/file_layer.h"
 #include "platform/property_list_coding.h"
 #include "platform/system_controls.h"
@@ -30,8 +32,12 @@ std::array<std::byte, kSwapUsageBytes> swapUsageRecord(std::uint64_t total, std:
 class LinuxSystemControls final : public SystemControls {
  public:
   LinuxSystemControls(const DeviceRoot& root, FileLayer& files, PropertyListCoding& propertyLists,
-                      SystemLog& log)
-      : root_(root), files_(files), propertyLists_(propertyLists), log_(log) {}
+                      SystemLog& log, EccEvents::Mode eccMode = EccEvents::Mode::Consume)
+      : root_(root),
+        files_(files),
+        propertyLists_(propertyLists),
+        log_(log),
+        eccEvents_(root, files, propertyLists, log, eccMode) {}
 
   /// `buffer` keeps its content on failure.
   Result read(std::string_view name, MutableByteSpan buffer) override;
@@ -44,6 +50,7 @@ class LinuxSystemControls final : public SystemControls {
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
   std::optional<plist::Dictionary> recorded_;
+  EccEvents eccEvents_;
 };
 
 }  // namespace tavrel

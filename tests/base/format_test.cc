@@ -38,9 +38,8 @@ void compare(const std::vector<std::string>& conversions, const std::vector<Argu
         for (const std::string& conversion : conversions) {
           std::string format = start;
           format.append(width).append(precision).append(conversion).append(">");
-          for (const Argument value : values) {
+          for (const Argument value : values)
             ASSERT_EQ(printed(format, {value}), printedByC(format, value)) << format;
-          }
         }
       }
     }
@@ -109,8 +108,7 @@ TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
   struct Case {
     std::string format;
     std::vector<FormatArgument> arguments;
-    std::string place;
-    std::string reason;
+    std::string place, reason;
   };
   const Case cases[] = {
       {"n=%n", {1}, R"("%n" at byte 2)", unknown},

@@ -111,8 +111,7 @@ TEST(CivilTime, ReadsOnlyWhatItWrites) {
 
 TEST(Utf8, TellsWellFormedFromMalformed) {
   struct Case {
-    std::string_view text;
-    std::string_view repaired;
+    std::string_view text, repaired;
   };
   const Case malformed[] = {
       {"\xC0\xAF", "\uFFFD\uFFFD"},                      // over-long

@@ -1,4 +1,3 @@
-#include <gtest/gtest.h>
 #include <sys/stat.h>
 
 #include "base/limits.h"
@@ -27,8 +26,6 @@ class ApplicationsTest : public testing::Test {
   KeptLog log;
   LinuxApplications applications{device.root, log};
 };
-
-using Lines = std::vector<std::string>;
 
 TEST_F(ApplicationsTest, CountsInstalledPackagesAndThoseOfTheUser) {
   device.write("/var/lib/dpkg/status",

@@ -1,5 +1,4 @@
 #include <cerrno>
-#include <gtest/gtest.h>
 
 #include "base/text.h"
 #include "platform/linux/file_preferences.h"
@@ -11,8 +10,6 @@
 
 namespace tavrel {
 namespace {
-
-using Lines = std::vector<std::string>;
 
 constexpr std::string_view kControls = "/etc/tavrel/system-controls.plist";
 constexpr std::string_view kLibraries = "/etc/tavrel/dynamic-libraries.plist";

@@ -26,9 +26,8 @@ std::uint64_t inodeOf(const fs::path& path) {
 
 std::map<std::string, std::uint64_t> namesIn(const fs::path& folder) {
   std::map<std::string, std::uint64_t> names;
-  for (const auto& entry : fs::directory_iterator(folder)) {
+  for (const auto& entry : fs::directory_iterator(folder))
     names[entry.path().filename()] = inodeOf(entry.path());
-  }
   return names;
 }
 

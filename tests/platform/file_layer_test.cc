@@ -1,9 +1,6 @@
 #include "platform/linux/file_layer.h"
 
-#include <filesystem>
-#include <gtest/gtest.h>
 #include <sys/stat.h>
-#include <unistd.h>
 
 #include "faulty_file_layer.h"
 #include "temporary_root.h"
@@ -29,8 +26,7 @@ TEST(FileLayer, ReadsRegularFilesOnlyAndUpToTheLimit) {
   EXPECT_EQ(*files.readIfPresent(at("/none"), 10), std::nullopt);
 
   const struct {
-    std::string_view path;
-    std::string_view reason;
+    std::string_view path, reason;
   } kRefused[] = {
       {"/full", ": it has more than 4999 bytes; move it away"},
       {"/folder", ": it is a folder; move it away"},
@@ -84,26 +80,33 @@ TEST(FileLayer, RemovesTemporaryFilesOnceTheyAreOld) {
   }
   FileLayer files;
   ASSERT_TRUE(files.replace(device.root.path("/d/file"), asBytes("x"), 0644));
-  for (const auto& file : kFiles) {
+  for (const auto& file : kFiles)
     EXPECT_EQ(fs::exists(device.root.path(file.name)), file.stays) << file.name;
-  }
 }
 
 TEST(FileLayer, AppendsWholeLines) {
   const TemporaryRoot device;
   FileLayer files;
   const std::string path = device.root.path("/logs/lines");
-  ASSERT_TRUE(files.append(path, asBytes("one\n"), 0640, 100));
-  ASSERT_TRUE(files.append(path, asBytes("tw"), 0640, 100));  // as a cut leaves it
-  ASSERT_TRUE(files.append(path, asBytes("three\n"), 0640, 100));
-  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n");
-  EXPECT_EQ(messageOf(files.append(path, asBytes("four\n"), 0640, 18)),
-            "cannot append to " + path + ": it may have 18 bytes");
+  {
+    auto file = files.openToAppend(path, 0640);
+    ASSERT_TRUE(file && file->append(asBytes("one\n"), 100));
+    ASSERT_TRUE(file->append(asBytes("tw"), 100));  // as a cut leaves it
+  }
+  auto file = files.openToAppend(path, 0640);
+  ASSERT_TRUE(file && file->append(asBytes("three\n"), 100) && file->append(asBytes("4\n"), 100));
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n");
+  EXPECT_EQ(messageOf(file->append(asBytes("five\n"), 19)),
+            "cannot append to " + path + ": it may have 19 bytes");
+  ASSERT_TRUE(file->append(asBytes("5\n"), 19));
+  file = Error{"released"};
 
-  FaultyFileLayer full(device.root.path("/"), FaultyFileLayer::Fault::Failure, 2);
-  EXPECT_EQ(messageOf(full.append(path, asBytes("five\n"), 0640, 100)),
+  FaultyFileLayer faulty(device.root.path("/"), FaultyFileLayer::Fault::Failure, 2);
+  auto full = faulty.openToAppend(path, 0640);
+  EXPECT_EQ(messageOf(full->append(asBytes("six\n"), 100)),
             "cannot write " + path + ": No space left on device; free some space");
-  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n");
+  EXPECT_TRUE(full->append(asBytes("seven\n"), 100));
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n5\nseven\n");
 }
 
 TEST(FileLayer, AReplacedFileIsOldOrNewAfterEveryFault) {

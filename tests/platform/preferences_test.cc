@@ -1,9 +1,5 @@
 #include <cmath>
-#include <filesystem>
-#include <gtest/gtest.h>
 #include <memory>
-#include <sys/wait.h>
-#include <unistd.h>
 
 #include "base/limits.h"
 #include "base/text.h"
@@ -136,8 +132,8 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   process.set("a", 1);
   EXPECT_FALSE(process.synchronize());
   EXPECT_FALSE(process.synchronize());
-  EXPECT_EQ(process.log.lines, std::vector<std::string>{"cannot use " + device.root.path(kFile) +
-                                                        ": it is a folder; move it away"});
+  EXPECT_EQ(process.log.lines,
+            Lines{"cannot use " + device.root.path(kFile) + ": it is a folder; move it away"});
   EXPECT_EQ(process.get("a"), "1");
   fs::remove(device.root.path(kFile));
   EXPECT_TRUE(process.synchronize());

@@ -1,17 +1,9 @@
 #include <chrono>
-#include <cstdlib>
 #include <fcntl.h>
-#include <filesystem>
-#include <functional>
-#include <gtest/gtest.h>
 #include <memory>
-#include <string>
 #include <sys/mman.h>
 #include <sys/socket.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
-#include <unistd.h>
-#include <vector>
 
 #include "base/limits.h"
 #include "platform/linux/file_notifications.h"
@@ -139,7 +131,7 @@ TEST_F(ServiceTest, DeliversMessagesOfBothSizesAndEncodingsInOrder) {
     listener.reset();
     EXPECT_FALSE(std::filesystem::exists(serviceSocketPath(*root, kName)));
   }
-  EXPECT_EQ(log.lines, std::vector<std::string>());
+  EXPECT_EQ(log.lines, Lines());
 }
 
 TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
@@ -196,7 +188,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
   }
   log.lines.clear();
   listener.reset();
-  EXPECT_EQ(log.lines, std::vector<std::string>{"10 more refusals were not logged"});
+  EXPECT_EQ(log.lines, Lines{"10 more refusals were not logged"});
 }
 
 TEST_F(ServiceTest, TakesABurstOfThousandsWithoutLoss) {
@@ -206,9 +198,8 @@ TEST_F(ServiceTest, TakesABurstOfThousandsWithoutLoss) {
   for (std::int64_t i = 0; i < kClients; ++i)
     clients.push_back(connect());
   for (std::int64_t round = 0; round < kEach; ++round) {
-    for (std::int64_t i = 0; i < kClients; ++i) {
+    for (std::int64_t i = 0; i < kClients; ++i)
       ASSERT_TRUE(clients[static_cast<std::size_t>(i)].send({{"client", i}, {"round", round}}));
-    }
   }
   clients.clear();
   while (closures < kClients)
@@ -220,7 +211,7 @@ TEST_F(ServiceTest, TakesABurstOfThousandsWithoutLoss) {
     const auto client = static_cast<std::size_t>(message.number("client")->int64());
     ASSERT_EQ(message.number("round")->int64(), next[client]++);
   }
-  EXPECT_EQ(log.lines, std::vector<std::string>());
+  EXPECT_EQ(log.lines, Lines());
 }
 
 TEST_F(ServiceTest, PeersBeyondTheLimitWaitForAPlace) {

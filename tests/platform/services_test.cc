@@ -1,7 +1,4 @@
-#include <cstdlib>
 #include <fcntl.h>
-#include <filesystem>
-#include <gtest/gtest.h>
 #include <limits>
 #include <regex>
 #include <sys/socket.h>
@@ -9,7 +6,6 @@
 #include <sys/statvfs.h>
 #include <sys/un.h>
 #include <sys/utsname.h>
-#include <unistd.h>
 
 #include "base/text.h"
 #include "fixed_clock.h"
@@ -109,10 +105,9 @@ TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {
     device.write(folder + name, "x\n");
   }
   reporting.FLDumpAllOldStructuredDataLogs();
-  EXPECT_EQ(
-      *device.files.list(device.root.path(folder)),
-      (std::vector<std::string>{"172-2026-10-28.jsonl", "172-2026-11-27.jsonl",
-                                "172-2030-01-01.jsonl", "notes.txt", "x172-1999-01-01.jsonl"}));
+  EXPECT_EQ(*device.files.list(device.root.path(folder)),
+            (Lines{"172-2026-10-28.jsonl", "172-2026-11-27.jsonl", "172-2030-01-01.jsonl",
+                   "notes.txt", "x172-1999-01-01.jsonl"}));
   EXPECT_TRUE(device.log.lines.empty());
 }
 

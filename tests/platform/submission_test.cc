@@ -1,7 +1,5 @@
 #include "platform/submission.h"
 
-#include <filesystem>
-#include <gtest/gtest.h>
 #include <set>
 
 #include "faulty_file_layer.h"

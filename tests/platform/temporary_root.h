@@ -19,6 +19,8 @@
 
 namespace tavrel {
 
+using Lines = std::vector<std::string>;
+
 /// Removed with everything in it at the end.
 class TemporaryRoot {
  public:
@@ -61,7 +63,7 @@ class KeptLog final : public SystemLog {
       return line.find(part) != std::string::npos;
     });
   }
-  std::vector<std::string> lines;
+  Lines lines;
 };
 
 /// The exit status of `body` in a process of its own.

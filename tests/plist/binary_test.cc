@@ -137,9 +137,8 @@ TEST(Binary, HostileObjectsAreRefused) {
       {{"\xA1\1"s, "\xD1\2\0"s, "\x51\x61"s}, "8: a container contains itself"},
       {expanding, "85: there are more than 1000000 values, after shared references are expanded"},
   };
-  for (const auto& row : rows) {
+  for (const auto& row : rows)
     EXPECT_EQ(errorOf(document(row.objects)), "binary property list, offset " + row.error);
-  }
 
   std::vector<std::string> nested;
   for (int i = 1; i < 129; ++i)
@@ -156,8 +155,7 @@ TEST(Binary, HostileTrailersAreRefused) {
   ASSERT_EQ(errorOf(good), "no error");
   const struct {
     std::size_t at;
-    std::string bytes;
-    std::string error;
+    std::string bytes, error;
   } rows[] = {
       {0, "bplist15", "0: it does not begin with \"bplist00\""},
       {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},

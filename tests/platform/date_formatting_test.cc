@@ -1,0 +1,69 @@
+#include <cmath>
+#include <gtest/gtest.h>
+
+#include "platform/linux/linux_date_formatting.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kPattern = "yyyy-MM-dd HH:mm:ss Z";
+
+// One block of a zone file: UTC from the first instant that a word of that size holds.
+std::string zoneBlock(std::size_t wordBytes) {
+  std::string block("TZif2");
+  block.resize(20);
+  for (const int count : {0, 0, 0, 1, 1, 4})  // the last: transitions, kinds of time, their names
+    block.append(3, '\0').push_back(static_cast<char>(count));
+  block.append("\x80").append(wordBytes - 1, '\0');
+  block.append(1, '\0');  // the first kind of time
+  block.append(6, '\0');  // its offset, daylight saving, name
+  return block.append("UTC\0", 4);
+}
+
+// A zone file in which `rule`, a zone in the form of POSIX, holds for all time.
+std::string zoneFile(std::string_view rule) {
+  return zoneBlock(4).append(zoneBlock(8)).append("\n").append(rule).append("\n");
+}
+
+TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
+  struct Case {
+    const char* rule;
+    double instant;  // seconds since 1970
+    const char* text;
+  };
+  static constexpr Case kCases[] = {
+      {"UTC0", 1794852138.75, "2026-11-16 18:02:18 +0000"},
+      {"<+0545>-5:45", 1794852138, "2026-11-16 23:47:18 +0545"},
+      {"<-0330>3:30", 0, "1969-12-31 20:30:00 -0330"},
+      {"<-12>12", -0.5, "1969-12-31 11:59:59 -1200"},
+      {"<-00>0:00:30", 60, "1970-01-01 00:00:30 +0000"},
+      {"CET-1CEST,M3.5.0,M10.5.0/3", 1774745999, "2026-03-29 01:59:59 +0100"},
+      {"CET-1CEST,M3.5.0,M10.5.0/3", 1774746000, "2026-03-29 03:00:00 +0200"},
+      {"<+14>-14", 253402300800, "10000-01-01 14:00:00 +1400"},
+      {"UTC0", -62135596801, "0001-12-31 23:59:59 +0000"},  // the year before year 1
+  };
+  for (const Case& row : kCases) {
+    const TemporaryRoot device;  // a file of its own for each zone
+    device.write("/etc/localtime", zoneFile(row.rule));
+    LinuxDateFormatting formatting(device.root);
+    EXPECT_EQ(formatting.format(plist::Date::since1970(row.instant), kPattern, "en_US_POSIX"),
+              row.text)
+        << row.rule;
+  }
+}
+
+TEST(DateFormatting, SurvivesWhatIsNoDateAndNoZone) {
+  const TemporaryRoot device;
+  device.write("/etc/localtime", "no zone file");
+  LinuxDateFormatting formatting(device.root);
+  const auto text = [&](double instant, std::string_view pattern) {
+    return formatting.format(plist::Date::since1970(instant), pattern, "en_US_POSIX");
+  };
+  EXPECT_EQ(text(std::nan(""), kPattern), "1970-01-01 00:00:00 +0000");
+  EXPECT_EQ(text(1e300, "yyyy QQ'yyyMMM%d"), "292277026596 QQ'yyyMMM%d");
+  EXPECT_EQ(text(-1e300, "yyyy"), "292277022658");
+}
+
+}  // namespace
+}  // namespace tavrel
