@@ -36,6 +36,10 @@ inline constexpr std::size_t kHistogramBoundaries = 65'536;
 /// Bytes of an allocation whose size a device decides. More counts as a failed allocation.
 inline constexpr std::uint64_t kDeviceAllocationBytes = 64U << 20;
 
+/// Entries of one parsed statistics context. A real buffer has some 1,300; each takes 232 bytes, so
+/// that a buffer of the largest size could ask for two GB. More counts as a failed allocation.
+inline constexpr std::size_t kStatisticsEntries = 1'000'000;
+
 /// How long a locked statistics store is waited for, in milliseconds.
 inline constexpr int kStoreBusyMilliseconds = 10'000;
 

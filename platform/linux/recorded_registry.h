@@ -2,6 +2,9 @@
 //
 // Linux has no such registry: what a device's drivers publish and answer is recorded as property
 // lists in /var/lib/tavrel/registry under the device root. docs/registry.md describes the format.
+//
+// A walk goes on over the services as they were when it began. It stops being valid when the
+// generation of the recordings is no longer the one that it began with.
 #pragma once
 
 #include <memory>
@@ -18,10 +21,11 @@ namespace tavrel {
 
 class RecordedRegistry final : public DriverRegistry {
  public:
-  /// Reads the folder when it is first asked for a service.
+  /// Reads the folder when it is first asked for a service, and again what has changed since.
   RecordedRegistry(const DeviceRoot& root, FileLayer& files, PropertyListCoding& propertyLists,
                    SystemLog& log);
-  /// Plays one recording, in the form that a file of the folder has.
+  /// Plays one recording, in the form that a file of the folder has. The dictionary is shared: a
+  /// change of it is seen, of its services and channels once its "Generation" has changed too.
   RecordedRegistry(const plist::Dictionary& recording, SystemLog& log);
   ~RecordedRegistry() override;
 
@@ -29,9 +33,13 @@ class RecordedRegistry final : public DriverRegistry {
   KernelReturn matchingServices(const plist::Dictionary& matching,
                                 std::unique_ptr<ServiceIterator>& services) override;
 
+  /// Everything that the registry shows now, as one recording that plays back the same.
+  plist::Dictionary recording();
+
  private:
-  struct Recording;
-  std::unique_ptr<Recording> recording_;
+  class State;
+  class Walk;
+  std::shared_ptr<State> state_;
 };
 
 }  // namespace tavrel
