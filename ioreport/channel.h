@@ -1,0 +1,91 @@
+// The channel: a dictionary that says who publishes a quantity, under which id and type, and what
+// it is called.
+//
+// A channel's legend is an array of its id, its type and, if it has one, its name. It belongs to
+// whoever published it and is shared between the channel, its copies and its samples; therefore
+// `setChannelType` gives the channel a legend of its own before it changes it. The getters keep
+// what they worked out in the channel, and answer texts that are borrowed from it.
+//
+// Every 64-bit quantity that is absent or unreadable reads as `kInvalidValue`.
+#pragma once
+
+#include <cstdint>
+#include <limits>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+#include "ioreport/error_object.h"
+
+namespace tavrel {
+
+inline constexpr std::int64_t kInvalidValue = std::numeric_limits<std::int64_t>::min();
+
+/// The first byte of a channel type: how the values of its elements are laid out.
+inline constexpr std::uint8_t kFormatUnknown = 0;
+inline constexpr std::uint8_t kFormatSimple = 1;
+inline constexpr std::uint8_t kFormatState = 2;
+inline constexpr std::uint8_t kFormatHistogram = 3;
+inline constexpr std::uint8_t kFormatSimpleArray = 4;
+
+/// The fields of a channel type. Its other bits pass through unchanged.
+constexpr std::uint8_t formatOf(std::uint64_t channelType) {
+  return static_cast<std::uint8_t>(channelType);
+}
+constexpr std::uint16_t categoriesOf(std::uint64_t channelType) {
+  return static_cast<std::uint16_t>(channelType >> 16);
+}
+/// How many elements the channel occupies in a sample.
+constexpr std::uint16_t elementCountOf(std::uint64_t channelType) {
+  return static_cast<std::uint16_t>(channelType >> 32);
+}
+
+/// A number as a signed 64-bit integer; an unsigned one keeps its bits. A real number that is not
+/// whole, or beyond 64 bits, has none.
+std::int64_t integerOf(const std::optional<plist::Number>& number);
+
+/// A new legend; an empty handle when memory is short.
+plist::Array createLegendChannel(std::uint64_t channelID, std::uint64_t channelType,
+                                 std::optional<std::string_view> channelName, ErrorOut error);
+
+/// A new channel that shares the legend and the info; an empty handle for a legend without id or
+/// type. Group and subgroup are texts or null.
+plist::Dictionary createChannel(std::uint64_t driverID, std::string_view driverName,
+                                const plist::Array& legendChannel, const plist::Value& group,
+                                const plist::Value& subGroup, const plist::Dictionary& channelInfo,
+                                ErrorOut error);
+
+/// A channel that differs from another one in its legend only. All else is shared, down to the
+/// texts of the keys, so that the channels of a large legend are small.
+plist::Dictionary createSiblingChannel(const plist::Dictionary& sibling,
+                                       const plist::Array& legendChannel, ErrorOut error);
+
+KernelReturn getChannelType(const plist::Dictionary& channel, std::uint64_t& channelType);
+/// A legend that has no type yet gets one.
+KernelReturn setChannelType(const plist::Dictionary& channel, std::uint64_t channelType);
+
+std::uint8_t IOReportChannelGetFormat(const plist::Dictionary& channel);
+/// All bits set when the type cannot be read.
+std::uint16_t IOReportChannelGetCategories(const plist::Dictionary& channel);
+std::int64_t IOReportChannelGetDriverID(const plist::Dictionary& channel);
+std::int64_t IOReportChannelGetChannelID(const plist::Dictionary& channel);
+std::int64_t IOReportChannelGetUnit(const plist::Dictionary& channel);
+std::optional<std::string_view> IOReportChannelGetDriverName(const plist::Dictionary& channel);
+std::optional<std::string_view> IOReportChannelGetGroup(const plist::Dictionary& channel);
+std::optional<std::string_view> IOReportChannelGetSubGroup(const plist::Dictionary& channel);
+/// The name in the legend, else the id when it spells one.
+std::optional<std::string_view> IOReportChannelGetChannelName(const plist::Dictionary& channel);
+
+/// The printable characters that an id consists of, from its highest byte down and without zero
+/// bytes; nothing when a byte is not printable or all are zero.
+std::optional<std::string> _copyPrintableIDString(std::uint64_t id);
+
+/// Stores what a getter worked out, and answers the stored text.
+std::string_view keepText(plist::Dictionary channel, std::string_view key,
+                          const plist::Value& text);
+
+/// Null when there is no text.
+plist::Value textOrNull(std::optional<std::string_view> text);
+
+}  // namespace tavrel

@@ -1,0 +1,48 @@
+// Pairs the channels of one array with those of another.
+//
+// A channel is first compared with that at its own index. Otherwise the others are searched
+// forward, from behind the last one that a search found, or, before any was found, from behind the
+// channel's own index; positions before are never searched again, so that channels pair in order.
+// The first search sorts the others by what identifies them, so that many searches stay cheap.
+#pragma once
+
+#include <compare>
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+class ChannelPairing {
+ public:
+  explicit ChannelPairing(const plist::Array& others) : others_(others) {}
+
+  /// Sets the match of the channel at `index`, an empty handle when it has none. False when a type
+  /// cannot be read. Indexes are asked for in ascending order.
+  bool find(std::size_t index, const plist::Dictionary& channel, plist::Dictionary& match);
+
+ private:
+  struct Identity {
+    std::int64_t driverID;
+    std::int64_t channelID;
+    std::uint64_t type;
+    auto operator<=>(const Identity&) const = default;
+  };
+  struct Position {
+    Identity identity;
+    std::size_t index;
+    auto operator<=>(const Position&) const = default;
+  };
+
+  static std::optional<Identity> identityOf(const plist::Dictionary& channel);
+  void sortOthers();
+
+  plist::Array others_;
+  std::optional<std::vector<Position>> sorted_;
+  std::optional<std::size_t> searchStart_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,66 @@
+// Samples: copies of the subscribed channels that hold the elements which the channels had at one
+// time, under "RawElements".
+//
+// The elements of one channel stand together in a buffer, in a group; the first one counts them.
+// When two groups are of the same channel, the first counts. Samples own their elements and stay
+// valid after the next update.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <vector>
+
+#include "base/bytes.h"
+#include "base/plist.h"
+#include "ioreport/error_object.h"
+#include "ioreport/iteration.h"
+#include "ioreport/subscription.h"
+
+namespace tavrel {
+
+/// The current values of subscribed channels. A channel that the kernel left out is left out; an
+/// empty handle when sampling fails.
+plist::Dictionary IOReportCreateSamples(const IOReportSubscription* subscription,
+                                        const plist::Dictionary& subscribedChannels,
+                                        ErrorOut error);
+
+/// The same from a buffer that the caller has.
+plist::Dictionary IOReportCreateSamplesRaw(const plist::Dictionary& subscribedChannels,
+                                           ByteSpan buffer, ErrorOut error);
+
+/// Takes the samples of one buffer, which it borrows, channel by channel. The buffer is read once,
+/// whatever the number of channels.
+class SampleExtractor {
+ public:
+  explicit SampleExtractor(ByteSpan buffer);
+
+  /// Gives the copy of a channel its elements, and the type that is in them when the channel's own
+  /// is unknown. Answers `kIterateRemove` for a channel that is not in the buffer, and
+  /// `kIterateStop` when it could only stand behind a group of no elements, at which a buffer ends.
+  IterateResult extractChannelSample(const plist::Dictionary& channel,
+                                     plist::Dictionary& newChannel);
+
+  /// What sampling fails with, if it fails.
+  KernelReturn status() const { return status_; }
+
+ private:
+  // In the order in which they are searched: by channel, and each channel's in the buffer's order.
+  struct Group {
+    std::uint64_t providerID;
+    std::uint64_t channelID;
+    std::size_t offset;
+    std::size_t length;
+    auto operator<=>(const Group&) const = default;
+  };
+
+  std::optional<ByteSpan> groupOf(const plist::Dictionary& channel) const;
+
+  ByteSpan buffer_;
+  std::vector<Group> groups_;
+  bool endsInEmptyGroup_ = false;
+  KernelReturn status_ = kKernelError;
+  plist::String elementsKey_;  // one text for all samples
+};
+
+}  // namespace tavrel

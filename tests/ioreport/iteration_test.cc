@@ -1,0 +1,272 @@
+#include <gtest/gtest.h>
+#include <random>
+
+#include "reporting.h"
+
+namespace tavrel {
+namespace {
+
+using namespace reporting;
+
+constexpr auto kKeep = [](const auto&...) { return kIterateContinue; };
+
+// Channels of one letter each, filed by driver and group: the first letter of a text names the
+// driver, the second the group, "-" for none.
+Dictionary treeOf(std::initializer_list<std::string_view> texts) {
+  const Dictionary aggregate = IOReportCreateAggregate(3);
+  for (const std::string_view text : texts) {
+    const Text group = text[1] == '-' ? Text() : text.substr(1, 1);
+    const auto id = static_cast<std::uint64_t>(text[2]);
+    IOReportAddChannelDescription(aggregate, 7, text.substr(0, 1), id, 1, {}, group, {}, {}, {});
+  }
+  return aggregate;
+}
+
+Dictionary letters(std::string_view text) {
+  Dictionary aggregate = IOReportCreateAggregate(0);
+  for (const char letter : text)
+    _addChannel(aggregate, channelOf(7, letter, 1), 0, nullptr);
+  return aggregate;
+}
+
+struct WalkCase {
+  std::vector<IterateResult> answers;
+  std::string_view seen;
+  IterateResult result;
+  std::string_view left = "abcdef";
+};
+
+ChannelCallback answering(const WalkCase& row, std::string& seen) {
+  return [&](const Dictionary& channel) {
+    seen += IOReportChannelGetChannelName(channel).value_or("?");
+    return row.answers[(seen.size() - 1) % row.answers.size()];
+  };
+}
+
+TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
+  const WalkCase kIterated[] = {{{0}, "abcdef", 0},       {{0, 2, 0, 4}, "abcdef", 6},
+                                {{0, 0, 1, 0}, "abc", 1}, {{2, 3}, "ab", 3},
+                                {{16}, "abcdef", 16},     {{0, -1, 2}, "ab", -1}};
+  const WalkCase kPruned[] = {{{16}, "abcdef", 16, ""},
+                              {{0}, "abcdef", 0},
+                              {{2}, "abcdef", 2},
+                              {{16, 0}, "abcdef", 16, "bdf"},
+                              {{0, 16, 16}, "abcdef", 16, "ad"},
+                              {{16, 2, 16, 1}, "abcd", 1, "bdef"},
+                              {{16, 17}, "ab", 17, "bcdef"}};
+  for (const bool isTree : {false, true}) {
+    const auto make = [&] {
+      return isTree ? treeOf({"d-a", "dgb", "dgc", "e-d", "f-e", "f-f"}) : letters("abcdef");
+    };
+    for (const WalkCase& row : kIterated) {
+      std::string seen;
+      EXPECT_EQ(IOReportIterate(make(), answering(row, seen)), row.result);
+      EXPECT_EQ(seen, row.seen);
+    }
+    for (const WalkCase& row : kPruned) {
+      std::string seen;
+      const Dictionary pruned = make();
+      EXPECT_EQ(IOReportPrune(pruned, answering(row, seen)), row.result);
+      EXPECT_EQ(seen, row.seen);
+      EXPECT_EQ(namesIn(pruned), row.left);
+      EXPECT_EQ(IOReportGetChannelCount(pruned), static_cast<std::int32_t>(row.left.size()));
+      EXPECT_EQ(pruned.size(), row.left.empty() ? 1U : 2U);  // the options, and what is left
+    }
+  }
+}
+
+TEST(IterationTest, FailsForMalformedAggregates) {
+  Dictionary endless = Dictionary::create();
+  endless.set("IOReportDrivers", Dictionary{{"a", endless}, {"b", endless}});
+  Dictionary deep = letters("a");
+  for (int i = 0; i < 200; ++i)
+    deep = Dictionary{{"IOReportChannelGroups", Dictionary{{"g", deep}}}};
+  const auto drivers = [](const Value& levels) { return Dictionary{{"IOReportDrivers", levels}}; };
+  const Dictionary kCases[] = {{},
+                               endless,
+                               deep,
+                               aggregateOf({5}),
+                               aggregateOf(5),
+                               drivers(5),
+                               aggregateOf({channelOf(7, 1, 1), "text"}),
+                               drivers(Dictionary::create()),
+                               {{"IOReportChannelGroups", Dictionary{{"g", 5}}}},
+                               drivers(Dictionary{{"d", aggregateOf({5})}})};
+  for (const Dictionary& aggregate : kCases) {
+    EXPECT_EQ(IOReportIterate(aggregate, kKeep), 273);
+    EXPECT_EQ(IOReportGetChannelCount(aggregate), -1);
+    EXPECT_FALSE(cloneAggregate(aggregate, kKeep));
+    EXPECT_FALSE(compareAggregates(aggregate, aggregate, kKeep));
+    EXPECT_EQ(IOReportMergeChannels(Dictionary::create(), aggregate, nullptr), 273);
+    EXPECT_EQ(IOReportPrune(aggregate, kKeep), 273);
+  }
+  endless.remove("IOReportDrivers");
+  EXPECT_EQ(iterateAggregate(letters("a"), {}, CloneWalk{kKeep}, nullptr), 273);
+  EXPECT_EQ(IOReportIterate(letters("a"), nullptr), 273);
+  // Entries that are no levels are passed over when there are others.
+  EXPECT_EQ(IOReportGetChannelCount(drivers(Dictionary{{"a", 5}, {"b", letters("b")}})), 1);
+}
+
+TEST(IterationTest, MergesByReferenceAsTheDestinationFiles) {
+  const Dictionary source = letters("abc");
+  const Dictionary destination = IOReportCreateAggregate(1);
+  EXPECT_EQ(IOReportMergeChannels(destination, source, nullptr), 0);
+  const Dictionary driver = destination.dictionary("IOReportDrivers").dictionary("disk <id 0x7>");
+  EXPECT_TRUE(channelIn(driver, 2).isSame(channelIn(source, 2)));
+  const std::tuple<Dictionary, IterateResult, std::string> kCases[] = {
+      {source, 273, "e00002c2 bad argument"},
+      {{}, 273, "e00002c2 bad argument"},
+      {aggregateOf("text"), 1, "e00002bc _addChannel() failed"}};
+  for (const auto& [into, result, text] : kCases) {
+    Failure failure;
+    EXPECT_EQ(IOReportMergeChannels(into, source, failure), result);
+    EXPECT_EQ(failure.text(), text);
+  }
+  // A source that holds the destination, or shares its channels, is still finite.
+  const Dictionary tree = treeOf({"d-a", "e-b"});
+  const Dictionary inside = tree.dictionary("IOReportDrivers").dictionary("d");
+  EXPECT_EQ(IOReportMergeChannels(inside, tree, nullptr), 0);
+  EXPECT_EQ(namesIn(tree), "aabb");
+  const Dictionary sharing = aggregateOf(source.array("IOReportChannels"));
+  EXPECT_EQ(IOReportMergeChannels(sharing, source, nullptr), 0);
+  EXPECT_EQ(namesIn(source), "abcabc");
+}
+
+TEST(IterationTest, ClonesWhatIsKept) {
+  const Dictionary tree = treeOf({"d-a", "dgb", "e-c"});
+  const Dictionary clone = cloneAggregate(tree, [](const Dictionary& channel, Dictionary& copy) {
+    copy.set("ChannelName", "x");
+    return IOReportChannelGetChannelName(channel) == "b" ? 4 : kIterateContinue;
+  });
+  EXPECT_EQ(namesIn(clone) + namesIn(tree), "xxabc");
+  EXPECT_FALSE(clone.contains("QueryOpts"));
+  const Dictionary driver = clone.dictionary("IOReportDrivers").dictionary("d");
+  EXPECT_EQ(driver.get("IOReportChannelGroups"), (Dictionary{{"g", aggregateOf(Array::create())}}));
+}
+
+// Behind its own index a channel is searched for from i + 1, or from behind the last one found so.
+// The rule of pairing, as plainly as it can be written; "-" for no match.
+std::string plainPairs(std::string_view channels, std::string_view others) {
+  std::string pairs;
+  std::optional<std::size_t> start;
+  for (std::size_t i = 0; i < channels.size(); ++i) {
+    std::size_t found = i;
+    if (i >= others.size() || others[i] != channels[i]) {
+      found = others.find(channels[i], start.value_or(i + 1));
+      if (found != std::string_view::npos) start = found + 1;
+    }
+    pairs += found == std::string_view::npos ? "-" : format("%zu", found);
+  }
+  return pairs;
+}
+
+TEST(PairingTest, PairsAsThePlainRuleDoes) {
+  std::mt19937 random(1);
+  const auto word = [&] {
+    std::string text(random() % 10, 'a');
+    for (char& letter : text)
+      letter = static_cast<char>('a' + random() % 4);
+    return text;
+  };
+  for (int round = 0; round < 3000; ++round) {
+    const std::string channels = word();
+    const std::string others = word();
+    Array walked = Array::create();
+    for (const char letter : channels)
+      walked.append(sampleOf(1, {{}}, letter));
+    Array otherSamples = Array::create();
+    for (std::size_t i = 0; i < others.size(); ++i) {
+      otherSamples.append(sampleOf(1, {{}}, others[i]));
+      otherSamples.at(i).dictionary().set("Position", format("%zu", i));
+    }
+    std::string pairs;
+    const auto note = [](const Dictionary& match, const Dictionary&, Dictionary& copy) {
+      EXPECT_EQ(getRawElements(copy, 1).value(0, 3), kNone);
+      copy.set("Match", match.get("Position"));
+      return kIterateContinue;
+    };
+    const auto paired = compareAggregates(aggregateOf(otherSamples), aggregateOf(walked), note);
+    for (const Value& channel : paired.array("IOReportChannels"))
+      pairs += channel.dictionary().string("Match").value_or("-");
+    ASSERT_EQ(pairs, plainPairs(channels, others)) << channels << " " << others;
+  }
+}
+
+TEST(PairingTest, FailsWhereTheOtherAggregateDiffersInShape) {
+  const Dictionary sample = aggregateOf({sampleOf(1, {{}})});
+  const Dictionary typeless = aggregateOf({Dictionary{{"DriverID", 7}}});
+  const Dictionary noElements = aggregateOf({channelOf(7, 9, typeOf(1, 1))});
+  const Dictionary ofD{{"IOReportDrivers", Dictionary{{"d", sample}}}};
+  const Dictionary ofE{{"IOReportDrivers", Dictionary{{"e", sample}}}};
+  const Dictionary none = aggregateOf(Array::create());
+  const std::pair<Dictionary, Dictionary> kCases[] = {{{}, sample},
+                                                      {Dictionary::create(), sample},
+                                                      {aggregateOf({5}), sample},
+                                                      {typeless, sample},
+                                                      {sample, typeless},
+                                                      {none, typeless},
+                                                      {sample, ofD},
+                                                      {noElements, sample},
+                                                      {ofE, ofD}};
+  for (const auto& [other, aggregate] : kCases)
+    EXPECT_FALSE(compareAggregates(other, aggregate, kKeep));
+  EXPECT_EQ(compareAggregates(none, sample, kKeep), sample);
+}
+
+TEST(SelectionTest, CopiesByCategoryFormatUnitAndGroup) {
+  const auto entry = [](const Value& group, const Value& subGroup,
+                        std::initializer_list<Value> channels) {
+    Dictionary made = aggregateOf(channels);
+    made.set("IOReportGroupName", group);
+    made.set("IOReportSubGroupName", subGroup);
+    made.set("IOReportChannelInfo", IOReportCreateUnitInfo(group ? 1ULL << 63 | 5 : 5));
+    return made;
+  };
+  const Array legend{
+      entry({}, {}, {Array{1, typeOf(1, 1, 0x100), "a"}, Array{2, typeOf(2, 1, 0x8101), "b"}}),
+      entry("G", {}, {Array{3, 3, "c"}}), entry("G", "S", {Array{4, 1, "d"}}),
+      entry("H", "S", {Array{5, 2, "e"}}), entry("H", "T", {Array{6, 2, "f"}})};
+  Drivers drivers(Array{driverOf("disk", 7, legend)});
+  const auto names = [&](auto copy, auto... what) {
+    return namesIn(copy(drivers.registry, drivers.streams, what..., 3, nullptr));
+  };
+  for (const auto& [categories, left] : {std::pair(0x0100, "ab"), {0x8000, "b"}, {0, ""}})
+    EXPECT_EQ(names(IOReportCopyChannelsInCategories, static_cast<std::uint16_t>(categories)),
+              left);
+  EXPECT_EQ(names(IOReportCopyChannelsOfFormat, std::uint8_t{1}), "ad");
+  EXPECT_EQ(names(IOReportCopyChannelsWithUnit, 1ULL << 63 | 5), "cdef");
+  EXPECT_EQ(names(IOReportCopyChannelsWithUnit, 5ULL), "ab");
+  const std::tuple<Text, Text, std::string_view> kGroups[] = {
+      {"G", {}, "cd"}, {{}, "S", "de"}, {"H", "S", "e"}, {"", {}, ""}, {{}, {}, ""}};
+  for (const auto& [group, subGroup, left] : kGroups)
+    EXPECT_EQ(names(IOReportCopyChannelsInGroup, group, subGroup), left);
+  Failure failure;
+  EXPECT_EQ(IOReportSelectChannelsInGroup(aggregateOf({5}), "G", {}, failure), 1);
+  EXPECT_EQ(failure.text(), "e00002bc channel pruning failed");
+  EXPECT_EQ(IOReportSelectChannelsInGroup(letters("a"), {}, {}, failure), 1);
+  EXPECT_EQ(failure.text(), "e00002c2 no group or subgroup!");
+}
+
+TEST(GetterTest, NamesChannelsByLegendOrId) {
+  const std::pair<Array, Text> kCases[] = {{{1, 1, "named"}, "named"},
+                                           {{0x53544154, 1}, "STAT"},
+                                           {{0x41004200, 1}, "AB"},
+                                           {{0x7E20, 1, 5}, "~ "},
+                                           {{0x01020304, 1}, {}},
+                                           {{0x7F414243, 1}, {}},
+                                           {{0xE944, 1}, {}},
+                                           {{0, 1}, {}},
+                                           {{}, {}}};
+  for (const auto& [legend, name] : kCases) {
+    const Dictionary channel{{"LegendChannel", legend}, {"DriverID", 1}};
+    EXPECT_EQ(IOReportChannelGetChannelName(channel), name);
+    EXPECT_EQ(channel.string("ChannelName"), name);
+  }
+  const Dictionary kept{{"ChannelName", "kept"}, {"LegendChannel", Array{1, 1, "new"}}};
+  EXPECT_EQ(IOReportChannelGetChannelName(kept), "kept");
+  EXPECT_EQ(IOReportChannelGetCategories({}), 0xFFFF);
+  EXPECT_EQ(IOReportChannelGetDriverID({}), kNone);
+}
+
+}  // namespace
+}  // namespace tavrel

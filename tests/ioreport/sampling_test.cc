@@ -1,0 +1,257 @@
+#include <gtest/gtest.h>
+#include <memory_resource>
+#include <random>
+
+#include "reporting.h"
+
+namespace tavrel {
+namespace {
+
+using namespace reporting;
+
+plist::Data simple(std::uint64_t id, std::int64_t value) {
+  return plist::Data(groupOf(id, typeOf(1, 1, 5), {{{value}}}));
+}
+Dictionary hubChannel(std::uint64_t id, const Value& elements) {
+  return {{"DriverID", 7}, {"ChannelID", id}, {"Elements", elements}};
+}
+
+const Dictionary kWanted = aggregateOf(
+    {channelOf(7, 'A', typeOf(1, 1, 5)), channelOf(7, 'B', typeOf(1, 1, 5)), channelOf(7, 'C', 0)});
+const Dictionary kHub{{"Channels", Array{hubChannel('A', Array{simple('A', 10), simple('A', 25)}),
+                                         hubChannel('C', simple('C', 3))}}};
+
+struct OutOfMemory : std::pmr::memory_resource {
+  void* do_allocate(std::size_t, std::size_t) override { throw std::bad_alloc(); }
+  void do_deallocate(void*, std::size_t, std::size_t) override {}
+  bool do_is_equal(const memory_resource& other) const noexcept override { return this == &other; }
+};
+
+TEST(SubscriptionTest, SamplesWhatTheHubHolds) {
+  Drivers drivers({}, kHub);
+  Failure failure;
+  Dictionary subscribed;
+  const auto subscription =
+      IOReportCreateSubscription(drivers.registry, nullptr, kWanted, &subscribed, 0, failure);
+  ASSERT_TRUE(subscription) << failure.text();
+  EXPECT_EQ(subscribed, kWanted);
+  const auto valueOf = [](const Dictionary& samples, std::size_t index) {
+    return IOReportSimpleGetIntegerValue(channelIn(samples, index));
+  };
+  const Dictionary first = IOReportCreateSamples(subscription.get(), subscribed, failure);
+  const Dictionary second = IOReportCreateSamples(subscription.get(), subscribed, failure);
+  EXPECT_EQ(namesIn(first), "AC");  // the hub does not hold B
+  EXPECT_EQ(valueOf(second, 0), 25);
+  const Dictionary delta = IOReportCreateSamplesDelta(first, second, failure);
+  EXPECT_EQ(valueOf(delta, 0), 15);
+  EXPECT_EQ(valueOf(delta, 1), 0);
+  // The type of C came with its elements, into the samples only.
+  std::uint64_t type = 0;
+  EXPECT_EQ(getChannelType(channelIn(first, 1), type), kKernelSuccess);
+  EXPECT_EQ(type, typeOf(1, 1, 5));
+  EXPECT_EQ(IOReportChannelGetFormat(channelIn(subscribed, 2)), 0);
+  const Dictionary noType{{"DriverID", 7}, {"LegendChannel", Array{65}}};
+  const auto typed =
+      IOReportCreateSamplesRaw(aggregateOf({noType}), simple('A', 1).bytes(), failure);
+  EXPECT_EQ(valueOf(typed, 0), 1);
+  EXPECT_EQ(failure.text(), "none");
+  EXPECT_FALSE(IOReportCreateSamples(nullptr, subscribed, failure));
+  EXPECT_EQ(failure.text(), "e00002c2 " + kNoText);
+}
+
+TEST(SubscriptionTest, FailsAtEachStepWithItsOwnWords) {
+  const auto hubWith = [](const char* key, const Value& value) {
+    Dictionary hub = plist::mutableCopy(kHub);
+    hub.set(key, value);
+    return hub;
+  };
+  const auto refusing = [&](const char* method) {
+    return hubWith("MethodErrors", Dictionary{{method, 17}});
+  };
+  const Dictionary noType{{"DriverID", 1}, {"LegendChannel", Array{1}}};
+  const std::string kNoList = "e00002bd createInterestList() failed";
+  const std::tuple<Dictionary, Value, std::string> kCases[] = {
+      {{}, kHub, "e00002c2 bad arguments"},
+      {aggregateOf({5}), kHub, "e00002c2 iteration error"},
+      {aggregateOf(Array::create()), kHub, "e00002c2 no channels"},
+      {aggregateOf({channelOf(kNone, 1, 1)}), kHub, kNoList},
+      {aggregateOf({channelOf(7, kNone, 1)}), kHub, kNoList},
+      {aggregateOf({noType}), kHub, kNoList},
+      {kWanted, {}, "e00002f0 " + kNoText},
+      {kWanted, hubWith("OpenError", 17), "11 Could not open IOReportHub"},
+      {kWanted, refusing("0"), "11 kIOReportUserClientOpen failed"},
+      {kWanted, refusing("2"), "11 kIOReportUserClientConfigureInterests failed"},
+      {kWanted, hubWith("MapError", 17), "11 IOConnectMapMemory() failed"}};
+  Failure failure;
+  Dictionary subscribed;
+  const auto subscribe = [&](Drivers& drivers, const Dictionary& desired,
+                             std::pmr::memory_resource* memory = nullptr) {
+    return IOReportCreateSubscription(drivers.registry, memory, desired, &subscribed, 0, failure);
+  };
+  for (const auto& [desired, hub, text] : kCases) {
+    Drivers drivers({}, hub);
+    EXPECT_FALSE(subscribe(drivers, desired));
+    EXPECT_EQ(failure.text(), text);
+    EXPECT_FALSE(subscribed);
+  }
+  Drivers drivers({}, refusing("3"));
+  OutOfMemory memory;
+  EXPECT_FALSE(subscribe(drivers, kWanted, &memory));
+  EXPECT_EQ(failure.text(), "e00002bd " + kNoText);
+  const auto subscription = subscribe(drivers, kWanted);
+  ASSERT_TRUE(subscription);
+  EXPECT_FALSE(IOReportCreateSamples(subscription.get(), subscribed, failure));
+  EXPECT_EQ(failure.text(), "11 " + kNoText);
+  for (const std::int32_t count : {2, 4, -1, 0x555554E})  // there are 3
+    EXPECT_FALSE(createInterestList(kWanted, count)) << count;
+}
+
+// The rule of extraction, as plainly as it can be written: the element at which the channel's
+// group stands, -1 for none, -2 when an empty group ends the sampling.
+int plainGroup(ByteSpan buffer, std::uint64_t channelID) {
+  const std::size_t elements = buffer.size() / 64;
+  for (std::size_t i = 0; i < elements;) {
+    const std::size_t count = *loadLittle16(buffer, i * 64 + 20);
+    if (count == 0) return -2;
+    if (*loadLittle64(buffer, i * 64) == 7 && *loadLittle64(buffer, i * 64 + 8) == channelID) {
+      return i + count <= elements ? static_cast<int>(i) : -1;
+    }
+    i += count;
+  }
+  return -1;
+}
+
+TEST(SamplesTest, ExtractsAsThePlainRuleDoes) {
+  std::mt19937 random(1);
+  for (int round = 0; round < 3000; ++round) {
+    std::vector<std::byte> buffer;
+    const std::size_t elements = 1 + random() % 8;
+    for (std::size_t i = 0; i < elements; ++i) {
+      const std::uint64_t count = random() % 8 == 0 ? random() % 2 * 65535 : 1 + random() % 3;
+      const std::uint64_t driver = random() % 9 == 0 ? 8 : 7;
+      append(buffer, {driver, 'A' + random() % 4, typeOf(1, count), 0, i, 0, 0, 0});
+    }
+    buffer.resize(buffer.size() + random() % 64);
+    Array channels = Array::create();
+    std::string expected;
+    bool stops = false;
+    for (std::uint64_t id = 'A'; id < 'F' && !stops; ++id) {
+      channels.append(channelOf(7, static_cast<std::int64_t>(id), typeOf(1, 1)));
+      const int at = plainGroup(buffer, id);
+      stops = at == -2;
+      if (at >= 0) expected += format("%llu:%d ", id, at);
+    }
+    const auto samples = IOReportCreateSamplesRaw(aggregateOf(channels), buffer, nullptr);
+    ASSERT_EQ(static_cast<bool>(samples), !stops);
+    std::string found;
+    for (const Value& channel : samples.array("IOReportChannels")) {
+      const Elements raw = getRawElements(channel.dictionary(), 1);
+      const std::int64_t at = raw.value(0, 0);
+      EXPECT_EQ(raw.count(), *loadLittle16(buffer, static_cast<std::uint64_t>(at) * 64 + 20));
+      found += format("%llu:%lld ", raw.channelID(0), at);
+    }
+    ASSERT_EQ(found, stops ? "" : expected);
+  }
+}
+
+TEST(SamplesTest, TellsWhyThereAreNone) {
+  const auto one = groupOf('A', typeOf(1, 1), {{}});
+  auto ended = one;
+  append(ended, {7, 'B', typeOf(1, 0), 0, 0, 0, 0, 0});
+  const ByteSpan empty = ByteSpan(ended).subspan(64);
+  const auto other = groupOf('X', typeOf(1, 1), {{}});
+  const Dictionary onlyA = aggregateOf({channelIn(kWanted)});
+  const std::string kFailure = " couldn't create samples";
+  const std::tuple<Dictionary, ByteSpan, std::string> kCases[] = {
+      {{}, one, "e00002c2" + kFailure},
+      {kWanted, {}, "e00002c2" + kFailure},
+      {kWanted, ByteSpan(one).first(63), "e00002c2" + kFailure},
+      {kWanted, empty, "e00002bc" + kFailure},
+      {kWanted, ended, "e00002bc" + kFailure},
+      {onlyA, ended, "none"},
+      {aggregateOf({channelIn(kWanted, 1), 5}), one, "e00002f0" + kFailure},
+      {kWanted, other, "none"}};  // without any channel
+  for (const auto& [channels, buffer, text] : kCases) {
+    Failure failure;
+    IOReportCreateSamplesRaw(channels, buffer, failure);
+    EXPECT_EQ(failure.text(), text);
+  }
+}
+
+struct DeltaCase {
+  std::uint64_t format;
+  Sample previous, current;
+  std::optional<Sample> delta;  // none: it fails
+};
+
+const DeltaCase kDeltas[] = {
+    {1, {{{10}}}, {{{25}}}, Sample{{{15}}}},
+    {1, {{{25}}}, {{{10}}}, Sample{{{-15}}}},
+    {1, {{{-2}}}, {{{INT64_MAX}}}, Sample{{{INT64_MIN + 1}}}},
+    {1, {{{kNone}}}, {{{1}}}, {}},
+    {1, {{{1}}}, {{{kNone}}}, {}},
+    {1, {{}, {}}, {{}, {}}, {}},
+    {2, {{{5, 1, 2, 3}, 1}}, {{{7, 10, -1, 4}, 2}}, Sample{{{7, 9, -3, 4}, 2}}},
+    {2, {{{5, kNone, 2}}}, {{{5, 1, 2}}}, {}},
+    {2, {{}, {{5, 1, 2}}}, {{}, {{5, 1, kNone}}}, {}},
+    {3, {{{5, 1, 2, 3}}}, {{{5, 7, 8, kNone}}}, Sample{{{0, 7, 8, kNone}}}},
+    {3, {{{0, 1, 2, kNone}}}, {{{3, 7, 8, 9}}}, Sample{{{3, 7, 8, 9}}}},
+    {3, {{{4, 1, 2, 30}}}, {{{6, 7, 8, 9}}}, Sample{{{2, 7, 8, -21}}}},
+    {3, {{{kNone}}}, {{{1}}}, {}},
+    {3, {{{1}}}, {{{kNone}}}, {}},
+    {3, {{{1, 0, 0, 5}}}, {{{2, 0, 0, kNone}}}, {}},
+    {3, {{{1, 0, 0, kNone}}}, {{{2, 0, 0, 5}}}, {}},
+    {4, {{{1, kNone, 7, kNone}}}, {{{5, 7, kNone, kNone}}}, Sample{{{4, 7, 7, kNone}}}},
+};
+
+TEST(DeltaTest, SubtractsByFormat) {
+  for (const auto& [format, previousElements, currentElements, expected] : kDeltas) {
+    const Dictionary previous = sampleOf(format, previousElements);
+    const Dictionary current = sampleOf(format, currentElements);
+    const Value before = plist::deepCopy(Array{previous, current});
+    Failure failure;
+    const Dictionary delta = IOReportSampleCreateDelta(previous, current, failure);
+    const Dictionary deltas =
+        IOReportCreateSamplesDelta(aggregateOf({previous}), aggregateOf({current}), nullptr);
+    EXPECT_EQ(Value(Array{previous, current}), before);
+    ASSERT_EQ(static_cast<bool>(delta), expected.has_value());
+    ASSERT_EQ(static_cast<bool>(deltas), expected.has_value());
+    EXPECT_EQ(failure.text(), delta ? "none" : (format == 1 ? "e00002bc " : "1 ") + kNoText);
+    if (!expected) continue;
+    EXPECT_EQ(delta.get("RawElements"), sampleOf(format, *expected).get("RawElements"));
+    // Of a simple channel only the first value is one.
+    const Elements paired = getRawElements(channelIn(deltas), static_cast<std::uint8_t>(format));
+    for (std::size_t i = 0; i < (format == 1 ? 1 : 4); ++i)
+      EXPECT_EQ(paired.value(0, i), expected->front().values.at(i));
+    // The result may be the current sample itself.
+    EXPECT_EQ(computeDelta(previous, current, current, nullptr), kKernelSuccess);
+    EXPECT_EQ(getRawElements(current, static_cast<std::uint8_t>(format)).value(0, 0),
+              expected->front().values[0]);
+  }
+}
+
+TEST(DeltaTest, RefusesWhatItCannotSubtract) {
+  const Dictionary simple1 = sampleOf(1, {{}});
+  const Dictionary unknown = sampleOf(5, {{}});
+  const std::tuple<Dictionary, Dictionary, std::string> kCases[] = {
+      {simple1, sampleOf(4, {{}}), "e00002c2 mismatched formats"},
+      {unknown, unknown, "e00002e6 unknown report format"},
+      {sampleOf(0, {{}}), simple1, "e00002c2 " + kNoText},
+      {{}, simple1, "e00002c2 " + kNoText},
+      {simple1, {}, "e00002c2 " + kNoText},
+      {channelOf(7, 9, typeOf(2, 1)), sampleOf(2, {{}}), "1 " + kNoText},
+      {sampleOf(2, {{}}), sampleOf(2, {{}, {}}), "1 " + kNoText},
+      {sampleOf(4, {{}, {}}), sampleOf(4, {{}}), "1 " + kNoText}};
+  for (const auto& [previous, current, text] : kCases) {
+    Failure failure;
+    EXPECT_FALSE(IOReportSampleCreateDelta(previous, current, failure));
+    EXPECT_EQ(failure.text(), text);
+  }
+  // In whole samples a channel without a match keeps its values.
+  Failure failure;
+  const Dictionary alone = aggregateOf({sampleOf(1, {{{12}}})});
+  EXPECT_EQ(IOReportCreateSamplesDelta(aggregateOf(Array::create()), alone, failure), alone);
+}
+
+}  // namespace
+}  // namespace tavrel
