@@ -4,6 +4,7 @@
 #include "config/persisted_state.h"
 #include "daemon/tasking.h"
 #include "report/bh_report.h"
+#include "storage/daily_statistics.h"
 
 namespace tavrel {
 
@@ -26,7 +27,7 @@ void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& 
   if (platform.submission.isDiagnosticSubmissionEnabled()) {
     BHReport(platform).writeLogForYesterday(day, appInfo);
   }
-  // The place of the daily storage statistics run.
+  dailyStorageStatistics(platform);
   platform.crashReporting.FLDumpAllOldStructuredDataLogs();
   trackOSChangeAndTasking(platform);
   platform.crashReporting.rollNorvaneCareLogs();

@@ -56,7 +56,7 @@ struct ListenerTest : ::testing::Test {
   }
 
   /// Serves clients that send these events in one process, and yields what was logged between the
-  /// start and the end.
+  /// start and the end, without what every run says of a device that has no storage to ask.
   Messages serve(const std::vector<plist::Value>& events) {
     fake.journal.clear();
     fake.log.entries.clear();
@@ -66,14 +66,14 @@ struct ListenerTest : ::testing::Test {
       fake.services.peerHandler(*peer);
       EXPECT_TRUE(peer->resumed);
     });
-    for (const plist::Value& event : events) {
+    for (const plist::Value& event : events)
       fake.eventLoop.events.push_back([peer, event] { peer->handler(event); });
-    }
     const char* const arguments[] = {"tavrel"};
     runTavrel(fake.platform, arguments);
     EXPECT_EQ(fake.services.name, "com.norvane.tallied.tavrel");
     EXPECT_EQ(fake.eventLoop.slices.back(), std::chrono::seconds(10));
     Messages messages = fake.log.messages();
+    std::erase(messages, "error reading nand info, error 1 with message Unable to parse buffer");
     return {messages.begin() + 1, messages.end() - 1};
   }
 
@@ -133,7 +133,9 @@ TEST_F(ListenerTest, ForcesADayOnce) {
   EXPECT_EQ(serve({Dictionary{{"operation", 1}, {"value", 18000}}, kAnnounce}),
             Messages{"daily tasks for day 18000"});
   EXPECT_EQ(fake.journal,
-            (fakes::Journal{"checkpoint", "clean structured logs", "roll support log"}));
+            (fakes::Journal{"checkpoint", "scalar com.norvane.lumenhall.DiskUsageUserTotalBlocks",
+                            "scalar com.norvane.lumenhall.DiskUsageUserBlocksFree",
+                            "clean structured logs", "roll support log"}));
   // Numbers count with their low halves.
   EXPECT_EQ(serve({Dictionary{{"operation", (std::int64_t{7} << 32) + 1},
                               {"value", (std::int64_t{7} << 32) - 5}}}),

@@ -16,8 +16,19 @@ using std::chrono_literals::operator""ms;
 
 constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
-const fakes::Journal kTasks{"checkpoint", "clean structured logs", "roll support log"};
-const fakes::Journal kGatedTasks{"checkpoint", "clean structured logs", "roll support log",
+// What every run says of a device that has no storage to ask.
+const std::string kNoStorage =
+    "error reading nand info, error 1 with message Unable to parse buffer";
+
+const std::string kTotal = "scalar com.norvane.lumenhall.DiskUsageUserTotalBlocks";
+const std::string kFree = "scalar com.norvane.lumenhall.DiskUsageUserBlocksFree";
+const fakes::Journal kTasks{"checkpoint", kTotal, kFree, "clean structured logs",
+                            "roll support log"};
+const fakes::Journal kGatedTasks{"checkpoint",
+                                 kTotal,
+                                 kFree,
+                                 "clean structured logs",
+                                 "roll support log",
                                  "set com.norvane.tallied.tavrel " + std::string(kDayKey),
                                  "synchronize com.norvane.tallied.tavrel"};
 
@@ -42,7 +53,7 @@ TEST_F(DailyRunTest, RunsOncePerDay) {
   runDailyIfNeeded(fake.platform, {});
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(storedDay(), plist::Value(19999));
-  EXPECT_EQ(fake.log.messages(), Messages{"daily tasks for day 19999"});
+  EXPECT_EQ(fake.log.messages(), (Messages{"daily tasks for day 19999", kNoStorage}));
 
   fake.journal.clear();
   runDailyIfNeeded(fake.platform, {});
@@ -54,7 +65,7 @@ TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
   fake.systemVersion.version = {{kProductBuildVersionKey, "21A5"}};
   dailyTasksForDay(fake.platform, 19999, {});
   EXPECT_EQ(fake.journal,
-            (fakes::Journal{"checkpoint", "clean structured logs",
+            (fakes::Journal{"checkpoint", kTotal, kFree, "clean structured logs",
                             "set com.norvane.tallied.tavrel LastOSUpdate", "roll support log"}));
 }
 
@@ -87,7 +98,7 @@ TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
   fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
   dailyTasksForDay(fake.platform, 19999, {});
   EXPECT_EQ(fake.journal, kTasks);
-  EXPECT_TRUE(fake.answers.questions.empty());  // nor was the whitelist looked at
+  EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{});  // nor was the whitelist looked at
 
   fake.submission.enabled = true;
   fake.journal.clear();
@@ -102,7 +113,7 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   run({"tavrel", "-d", "-t"});
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(fake.log.messages(),
-            (Messages{"tavrel started", "daily tasks for day 19999", "tavrel ended"}));
+            (Messages{"tavrel started", "daily tasks for day 19999", kNoStorage, "tavrel ended"}));
 
   run({"tavrel", "-f"});
   EXPECT_EQ(fake.journal, kTasks);

@@ -102,9 +102,8 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
 TEST_F(TaskingTest, SynchronisesEachDomainOnce) {
   own = {{"LastOSUpdate", Dictionary{{"version", "21A5"}, {"day", 1}}}};
   Array payload = Array::create();
-  for (int i = 0; i < 10000; ++i) {
+  for (int i = 0; i < 10000; ++i)
     payload.append(setting(format("domain.%d", i % 1000).c_str(), format("%d", i).c_str(), i));
-  }
   schedule({{"TaskingID", "many"}, {"TaskingPayload", payload}});
   const Journal journal = track();
   std::map<std::string, int> synchronised;

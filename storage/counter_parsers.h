@@ -1,0 +1,53 @@
+// Brings the counter block of a NAND chip into the common form.
+//
+//   const auto id = readManufacturerId(streams, "4582603A5700");
+//   const auto parse = selectCounterParser(chipGeneration("K2V"), id.vendor, id.device);
+//   TelemetryCounters counters;
+//   parse(block, counters);
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string_view>
+
+#include "platform/standard_streams.h"
+#include "storage/telemetry_counters.h"
+
+namespace tavrel {
+
+inline constexpr std::size_t kCounterBlockBytes = 4096;
+using CounterBlock = std::span<const std::byte, kCounterBlockBytes>;
+
+/// Fills the whole record: what the block does not tell is 0.
+using CounterParser = void (*)(CounterBlock block, TelemetryCounters& record);
+
+void parseOnlyAlgoGenericCounters(CounterBlock block, TelemetryCounters& record);
+void parseOnlyAlgoGenericCountersK4(CounterBlock block, TelemetryCounters& record);
+void parseCounters1y(CounterBlock block, TelemetryCounters& record);
+void parseCounters1xSandisk(CounterBlock block, TelemetryCounters& record);
+void parseCounters1xHynix(CounterBlock block, TelemetryCounters& record);
+/// The same as those with "Only".
+void parseCountersAlgoGeneric(CounterBlock block, TelemetryCounters& record);
+void parseCountersAlgoGenericK4(CounterBlock block, TelemetryCounters& record);
+
+/// Of a controller's "chip-id": 1, 2, or 0 for all others.
+std::uint32_t chipGeneration(std::string_view chipId);
+
+struct ManufacturerId {
+  std::uint16_t vendor = 0;
+  std::uint32_t device = 0;  // without its lowest byte
+};
+
+/// Of a controller's "manufacturer-id", up to 12 hexadecimal digits: 4 of the vendor, the rest of
+/// the device. Missing ones count as 0; other characters are told on standard output.
+ManufacturerId readManufacturerId(StandardStreams& streams, std::string_view text);
+
+/// Generations decide before makers.
+CounterParser selectCounterParser(std::uint32_t generation, std::uint32_t vendor,
+                                  std::uint32_t device);
+
+/// The name of one of the parsers.
+std::string_view counterParserName(CounterParser parser);
+
+}  // namespace tavrel

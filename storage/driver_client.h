@@ -1,0 +1,25 @@
+// A connection to a storage driver for as long as one piece of work takes.
+#pragma once
+
+#include "platform/driver_registry.h"
+#include "platform/standard_streams.h"
+
+namespace tavrel {
+
+/// Opens the service, has `use(UserClient&)` do its work, and closes. False when the service cannot
+/// be opened, else what `use` answers; failures of opening and closing are told on standard error.
+template <class Use>
+bool withClient(DriverService& service, StandardStreams& streams, Use use) {
+  std::unique_ptr<UserClient> client;
+  if (service.open(0, client) != kKernelSuccess) {
+    streams.writeError("Could not get connection to service\n");
+    return false;
+  }
+  const bool result = use(*client);
+  if (client->close() != kKernelSuccess) {
+    streams.writeError("Could not close connection to service\n");
+  }
+  return result;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,19 @@
+// Hexadecimal digits as numbers, leniently: a character that is no digit counts as 0 and is told on
+// standard output.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "platform/standard_streams.h"
+
+namespace tavrel {
+
+/// Of at most the first 2 characters.
+std::uint8_t hexStringToByte(StandardStreams& streams, std::string_view text);
+
+/// Of at most the first 8 characters, byte by byte from the left: an odd last character is a byte
+/// of its own, so that "abc" is 0xAB0C.
+std::uint32_t hexStringToInt32(StandardStreams& streams, std::string_view text);
+
+}  // namespace tavrel

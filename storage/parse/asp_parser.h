@@ -1,0 +1,33 @@
+// The parser of the storage controller's statistics buffer.
+//
+// The buffer is a sequence of records, each of whole units of 8 bytes, little-endian: the number of
+// a statistic (32 bits), a count (32 bits), and that many values of 64 bits. Nothing is printed.
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+
+#include "base/bytes.h"
+#include "storage/parse/asp_context.h"
+
+namespace tavrel {
+
+/// Adds what the buffer says to the context. 1 when every record was consumed, else 0: the buffer
+/// is shorter than a unit, a record is bad (the export version is then 0), or memory is short. What
+/// was recorded before a failure stays. Bytes behind the last whole unit are passed over.
+int ASPParseBufferToCxt(ASPContext& context, ByteSpan buffer);
+
+/// Frees the entries and makes the whole context zero.
+void ASPReleaseContext(ASPContext& context);
+
+/// Steps of the parser. They answer false when an entry cannot be allocated.
+
+/// Stores and lists all values of one record, already limited to the statistic's cap.
+bool ASPRecordValues(ASPContext& context, std::uint32_t key, std::string_view name,
+                     ByteSpan values);
+
+/// Lists a value under the name `prefix` + `suffix`, cut to 98 characters.
+bool ASPAppendEntry(ASPContext& context, std::string_view prefix, std::string_view suffix,
+                    std::uint64_t value);
+
+}  // namespace tavrel

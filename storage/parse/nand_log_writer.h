@@ -1,0 +1,37 @@
+// The NAND log: storage statistics as a short text for the submission service, once a week.
+//
+//   NLW_WriteLog(platform, "165", statistics);
+//
+// The log is a header that names the device and the moment, a blank line, and one line with every
+// statistic that is a number or a list of them: "IntermediateWamp:1.37;ValidityList[0]:12,40,7".
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+#include "platform/platform.h"
+
+namespace tavrel {
+
+inline constexpr std::string_view kNandLogName = "StorageStatus";
+
+/// Date: when the last log was written, in the program's default preference domain.
+inline constexpr std::string_view kDefaultPreferenceDomain = "com.norvane.zentrix.tavrel";
+inline constexpr std::string_view kNandLogLastLoggedKey = "SSLastLoggedAt";
+
+/// The least time from one log to the next, in seconds.
+inline constexpr double kNandLogPeriod = 604800;
+
+/// Writes the log unless the last one is younger than the period or is dated later than now. An
+/// empty handle for `statistics` writes nothing. The moment of the log is stored whether or not the
+/// submission service took it. A `PlatformException` of a service is logged and ends the call;
+/// every other exception passes on.
+void NLW_WriteLog(Platform& platform, std::string_view logType,
+                  const plist::Dictionary& statistics);
+
+/// The device's inverse identifier, "error" when the device does not tell it.
+std::string GetFaultlineKey(DeviceAnswers& deviceAnswers);
+
+}  // namespace tavrel

@@ -1,0 +1,48 @@
+// The descriptor that a storage controller supplies with snapshot records of any size: which
+// records there are, and place, kind and format of each of their fields.
+//
+// Little-endian, offsets in bytes from its start:
+//
+//    4  version                                 field table, at its offset:
+//    8  stride: bytes from record to record       0  count of fields
+//   12  count of records                          8  28 bytes a field:
+//   24  offset of the field table                      0  kind (16 bits)
+//   32  key, to its zero byte (version 6 on)           4  offset of the value in a record
+//                                                      8  bytes of latencies (kind 3)
+//                                                     12  format, 16 bytes, to its zero byte
+//
+// Kinds 0 and 1 are numbers, 2 microseconds, 3 latencies. Fields of further kinds print nothing,
+// and nothing of them is looked at but the offset of a first field: firmware to come may put
+// anything there.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <string_view>
+#include <vector>
+
+#include "base/bytes.h"
+#include "base/expected.h"
+#include "storage/parse/snapshot_field.h"
+
+namespace tavrel {
+
+/// A descriptor that can be trusted. Texts are borrowed from its bytes.
+struct SnapshotDescriptor {
+  std::optional<std::string_view> key;  // printed in place of the usual key of the columns
+  std::size_t stride;                   // bytes of a record
+  std::size_t count;                    // of records, all of them in the buffer
+  std::uint32_t presenceOffset;         // of the word that is 0 in an unused record
+  std::vector<SnapshotField> fields;    // that print something, all of them in the stride
+};
+
+/// Checks a descriptor against itself and against the size of its records' buffer. A record takes
+/// its whole stride, the last one too, and a field lies within its record. Refused, with the
+/// reason, is what leaves these bounds, a text without its zero byte, a table without fields when
+/// there are records (the first field tells which are used), and a format that asks for other
+/// arguments than its kind gives: numbers for kinds 0 to 2, a text for kind 3, no widths. A format
+/// may take fewer arguments than there are.
+Expected<SnapshotDescriptor> readSnapshotDescriptor(ByteSpan descriptor, std::size_t recordBytes);
+
+}  // namespace tavrel

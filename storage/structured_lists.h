@@ -1,0 +1,28 @@
+// What is logged of the lists that the storage driver answers with. All fields are little-endian.
+//
+// A callback takes a list's buffer and the controller's characteristics, and answers whether the
+// list could be logged. Diagnostics go to standard error. Texts can always be read and small
+// dictionaries made, so that nothing is said of those.
+#pragma once
+
+#include "base/bytes.h"
+#include "base/plist.h"
+#include "platform/platform.h"
+
+namespace tavrel {
+
+using ListCallback = bool (*)(Platform& platform, ByteSpan buffer,
+                              const plist::Value& characteristics);
+
+/// Writes the validity of blocks by bucket, the write amplification and the NAND information to the
+/// NAND log, when this run needs it (`gNeedValidityList`).
+bool logValidityList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
+
+/// Files one structured record for each flash channel.
+bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
+
+/// Files the factory's count of bad blocks and one structured record for each defect that grew
+/// since, as far as they lie in the buffer.
+bool logDefectsList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
+
+}  // namespace tavrel

@@ -1,0 +1,201 @@
+#include "storage/structured_log.h"
+
+#include <array>
+#include <memory>
+#include <new>
+#include <optional>
+#include <span>
+
+#include "storage/device_buffer.h"
+#include "storage/driver_client.h"
+#include "storage/fetch_statistics.h"
+#include "storage/nand_exporters.h"
+#include "storage/selector_request.h"
+#include "storage/structured_lists.h"
+
+namespace tavrel {
+
+double gCurrentUserWamp = 0;
+double gCurrentSysWamp = 0;
+bool gForceCollectionSet = false;
+bool gNeedValidityList = false;
+
+namespace {
+
+/// Above this the validity list is worth its place, unless a preference says otherwise.
+constexpr double kDefaultThreshold = 2.0;
+
+/// Bytes that write amplification is counted in, as a power of two.
+constexpr unsigned kUnitShift = 12;
+
+constexpr std::uint8_t kTelemetrySubLists = 3;
+
+struct WriteAmplification {
+  float user = 0;
+  float intermediate = 0;
+};
+
+WriteAmplification amplificationIn(const ASPContext& context) {
+  std::uint64_t slcPages = 0;
+  std::uint64_t intermediateErases = 0;
+  forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
+    if (name == "pagesPerVirtualBlockSlc") slcPages = entry.value;
+    if (name == "intermediateBandErases") intermediateErases = entry.value;
+  });
+  const auto hostWrites = static_cast<double>(context.hostWrites);
+  const std::uint64_t blockUnits =
+      (context.pagesPerVirtualBlock * context.bytesPerPage) >> kUnitShift;
+  const std::uint64_t slcUnits = (slcPages * context.bytesPerPage) >> kUnitShift;
+
+  WriteAmplification result;
+  result.user =
+      static_cast<float>(static_cast<double>(context.bandErases * blockUnits) / hostWrites);
+  if (slcUnits != 0 && intermediateErases != 0) {
+    result.intermediate =
+        static_cast<float>(static_cast<double>(slcUnits * intermediateErases) / hostWrites);
+  }
+  return result;
+}
+
+/// The threshold that a preference sets; nothing when it does not count.
+std::optional<float> preferredThreshold(Preferences& preferences) {
+  const auto number =
+      preferences.ZTXPreferencesGetValue("userWAmp", "com.norvane.NANDInfo").number();
+  if (!number || !number->isFloating()) return std::nullopt;
+  if (!(number->real() > 0 && number->real() < 10)) return std::nullopt;
+  return static_cast<float>(number->real());
+}
+
+bool exceedsThreshold(Platform& platform, float userAmplification) {
+  if (const auto threshold = preferredThreshold(platform.preferences)) {
+    return userAmplification > *threshold;
+  }
+  return gCurrentUserWamp > kDefaultThreshold;
+}
+
+/// Sets the process-wide figures of this run, and decides whether it logs the validity list.
+void measureWriteAmplification(Platform& platform) {
+  gCurrentUserWamp = gCurrentSysWamp = 0;
+  const std::unique_ptr<ASPContext> context(new (std::nothrow) ASPContext());
+  if (!context) {
+    platform.standardStreams.writeError("not enough memory?");
+    gNeedValidityList = gForceCollectionSet;
+    return;
+  }
+  WriteAmplification amplification;
+  const NandExporter* exporter = nullptr;
+  if (fetchStatistics(platform.drivers, platform.standardStreams, exporter, *context)) {
+    amplification = amplificationIn(*context);
+  }
+  if (exporter->release) exporter->release(*context);
+  gCurrentUserWamp = static_cast<double>(amplification.user);
+  gCurrentSysWamp = static_cast<double>(amplification.intermediate);
+  gNeedValidityList = gForceCollectionSet || exceedsThreshold(platform, amplification.user);
+}
+
+/// One query of a run.
+struct SelectorFunction {
+  SelectorGetter selectors = nullptr;
+  ListCallback callback = nullptr;
+  std::uint8_t subList = 0;
+};
+
+/// The queries of a run. What a driver does not offer is told on standard error.
+class SelectorFunctions {
+ public:
+  SelectorFunctions(const NandExporter& exporter, StandardStreams& streams) {
+    if (exporter.bandStatistics) {
+      add({exporter.bandStatistics, logValidityList, 0});
+    } else {
+      streams.writeError("Validity list retrieval is not supported\n");
+    }
+    if (exporter.telemetryList) {
+      for (std::uint8_t subList = 0; subList < kTelemetrySubLists; ++subList)
+        add({exporter.telemetryList, logTelemetryList, subList});
+    } else {
+      streams.writeError("Telemetry list retrieval is not supported\n");
+    }
+    if (exporter.defectsList) {
+      add({exporter.defectsList, logDefectsList, 0});
+    } else {
+      streams.writeError("Defects list retrieval is not supported\n");
+    }
+  }
+
+  std::span<const SelectorFunction> all() const { return std::span(functions_).first(count_); }
+
+ private:
+  void add(const SelectorFunction& function) { functions_[count_++] = function; }
+
+  std::array<SelectorFunction, kTelemetrySubLists + 2> functions_;
+  std::size_t count_ = 0;
+};
+
+/// Fetches one list and has it logged. False when it could not be logged; a list that the driver
+/// does not yield does not count as that.
+bool logList(Platform& platform, UserClient& client, const NandExporter& exporter,
+             const SelectorFunction& function, std::int32_t index, bool requestFlag,
+             const plist::Value& characteristics) {
+  StandardStreams& streams = platform.standardStreams;
+  const SelectorTable* const table = function.selectors();
+  if (!table) return false;
+
+  const auto sizeRequest = SelectorRequest::sizeQuery(*table, requestFlag, function.subList);
+  std::uint32_t size = 0;
+  if (const auto status = querySize(client, exporter, sizeRequest.bytes(), size)) {
+    streams.printError("IOConnectCallStructMethod failed with status 0x%x on selector index %d\n",
+                       status, index);
+    return true;
+  }
+  if (size == 0) return true;
+  const DeviceBuffer buffer = DeviceBuffer::allocate(size);
+  if (!buffer) {
+    streams.printError("Could not malloc %zd bytes", std::int64_t{size});
+    return false;
+  }
+  const auto request = SelectorRequest::fetch(*table, requestFlag, function.subList);
+  std::size_t length = 0;
+  if (fetchList(client, exporter, request.bytes(), buffer.bytes(), length) != kKernelSuccess) {
+    streams.printError("Could not retrieve data from driver for selector %u\n", table->fetch);
+    return true;
+  }
+  // Whatever the driver filled in, the list is as long as it said before; the rest is 0.
+  return function.callback(platform, buffer.bytes(), characteristics);
+}
+
+}  // namespace
+
+bool logStorageLists(Platform& platform, DriverService& service, const NandExporter& exporter,
+                     bool requestFlag) {
+  StandardStreams& streams = platform.standardStreams;
+  return withClient(service, streams, [&](UserClient& client) {
+    const plist::Value characteristics =
+        service.searchProperty("IOService", exporter.characteristicsProperty);
+    if (!characteristics) {
+      streams.writeError("failed to create dictionary");
+      return false;
+    }
+    const SelectorFunctions functions(exporter, streams);
+    bool isLogged = true;
+    std::int32_t index = 0;
+    for (const SelectorFunction& function : functions.all()) {
+      isLogged &=
+          logList(platform, client, exporter, function, index++, requestFlag, characteristics);
+    }
+    return isLogged;
+  });
+}
+
+bool DumpStorageStructuredLog(Platform& platform, bool requestFlag) {
+  measureWriteAmplification(platform);
+  const NandExporter* exporter = nullptr;
+  const auto service = findNandExporter(platform.drivers, exporter);
+  if (!service) {
+    platform.standardStreams.writeError(
+        "Could not get matching Kernkit service for exporting classes\n");
+    return false;
+  }
+  return logStorageLists(platform, *service, *exporter, requestFlag);
+}
+
+}  // namespace tavrel

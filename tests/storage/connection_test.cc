@@ -1,0 +1,189 @@
+#include <gtest/gtest.h>
+
+#include "recorded_driver.h"
+#include "storage/asp_connection.h"
+#include "storage/device_buffer.h"
+#include "storage/fetch_statistics.h"
+#include "storage/selector_request.h"
+
+namespace tavrel {
+namespace {
+
+using fakes::answering;
+using fakes::Bytes;
+using fakes::driver;
+using fakes::little32;
+using fakes::request;
+using fakes::statistics;
+using fakes::StoragePlatform;
+using plist::Array;
+using plist::Data;
+using plist::Dictionary;
+
+constexpr const char* kNVMe = "NorvaneEmbeddedNVMeController";
+constexpr const char* kCloseFailed = "Could not close connection to service\n";
+
+Dictionary with(const Dictionary& dictionary, const char* key, const plist::Value& value) {
+  auto copy = plist::mutableCopy(dictionary);
+  copy.set(key, value);
+  return copy;
+}
+
+// A driver that answers a size, and then each row of `fetch`.
+Dictionary sized(const Bytes& size, const Dictionary& fetch) {
+  return driver({Dictionary{{"Method", 8}, {"Request", request(13, 1)}, {"Output", Data(size)}},
+                 with(fetch, "Method", 8)});
+}
+
+TEST(ConnectionTest, FetchesStatistics) {
+  const Bytes buffer = statistics({{53, {0x20003}}, {4, {77}}});
+  const auto size = little32(static_cast<std::uint32_t>(buffer.size()));
+  const Dictionary whole{{"Request", request(13, 0)}, {"Output", Data(buffer)}};
+  const Dictionary failing{{"Error", kKernelError}};
+  const Dictionary good = driver(answering(buffer));
+  const Dictionary nvme = driver(answering(statistics({{4, {99}}}), 9), kNVMe);
+  const Dictionary refusing = with(good, "OpenError", kKernelError);
+  const struct {
+    Array services;
+    bool result;
+    std::string error;
+    std::uint64_t hostWrites = 0;
+  } kCases[] = {
+      {{}, false, "Could not get matching Kernkit service for exporting classes\n"},
+      {{good}, true, "", 77},
+      {{nvme, good}, true, "", 77},
+      {{nvme}, true, "", 99},
+      {{refusing, nvme}, false, "Could not get connection to service\n"},
+      {{with(good, "CloseError", kKernelError)}, true, kCloseFailed, 77},
+      {{driver({with(failing, "Method", 8)})}, false, "IOConnectCallStructMethod: -536870212"},
+      {{with(sized(little32(~0U), whole), "CloseError", 1)},
+       false,
+       std::string("Could not valloc 4294967295 bytes") + kCloseFailed},
+      {{sized(little32(0), {{"Output", Data(Bytes())}})}, false, ""},
+      {{sized(little32(3), {{"Output", Data(Bytes(3))}})}, false, ""},
+      {{sized(size, failing)}, false, "Could not retrieve data from driver for selector d\n"},
+      // The answer may be shorter than was said; what is left out is not read.
+      {{sized(little32(4096), whole)}, true, "", 77},
+      {{sized(size, with(whole, "OutputLength", 16))}, true, "", 0},
+      {{sized(size, with(whole, "OutputLength", 24))}, false, "", 0},
+  };
+  for (const auto& c : kCases) {
+    StoragePlatform platform(c.services);
+    const NandExporter* exporter = nullptr;
+    ASPContext context;
+    EXPECT_EQ(fetchStatistics(platform.drivers, platform.streams, exporter, context), c.result)
+        << c.error;
+    EXPECT_EQ(platform.streams.error, c.error);
+    EXPECT_EQ(platform.streams.output, "");
+    EXPECT_EQ(context.hostWrites, c.hostWrites) << c.error;
+    EXPECT_EQ(exporter->release == nullptr, c.services.empty());
+    EXPECT_EQ(exporter->className, c.services.empty()   ? ""
+                                   : c.hostWrites == 99 ? kNVMe
+                                                        : "ASPStorage");
+  }
+}
+
+TEST(ConnectionTest, AsksDriversInTheWayOfTheirRow) {
+  // Whoever sends a request with its query is refused.
+  const Bytes buffer = statistics({{4, {5}}});
+  Array methods;
+  for (const int flags : {0, 1})
+    methods.append(Dictionary{{"Method", 3}, {"Flags", flags}, {"Error", kKernelError}});
+  methods.append(Dictionary{{"Method", 3}, {"Output", Data(little32(16))}});
+  methods.append(Dictionary{{"Method", 4}, {"Output", Data(buffer)}});
+  StoragePlatform platform({driver(methods)});
+  const auto fetch = [&](SelectorGetter getter, std::uint32_t dataSelector) {
+    NandExporter row{.className = "ASPStorage",
+                     .sizeSelector = 3,
+                     .dataSelector = dataSelector,
+                     .statistics = getter,
+                     .parse = nand_exporters[0].parse};
+    ASPContext context;
+    return fetchStatisticsFrom(*platform.drivers.firstService("ASPStorage"), row, platform.streams,
+                               context);
+  };
+  static constexpr SelectorTable kNone{0xFFFFFFFF, 1};
+  EXPECT_FALSE(fetch([]() -> const SelectorTable* { return nullptr; }, 4));
+  EXPECT_FALSE(fetch([]() -> const SelectorTable* { return &kNone; }, 4));
+  EXPECT_TRUE(fetch(nullptr, 4));
+  EXPECT_EQ(platform.streams.error, "");
+  EXPECT_FALSE(fetch(nullptr, 5));
+  EXPECT_EQ(platform.streams.error, "Could not retrieve data from driver for selector 0\n");
+}
+
+TEST(ConnectionTest, EncodesRequests) {
+  const auto size = SelectorRequest::sizeQuery({0x01020304, 9}, true, 255);
+  const auto fetch = SelectorRequest::fetch({9, 0x01020304}, false, 2);
+  EXPECT_EQ(size.bytes().size(), 24U);
+  EXPECT_EQ(loadLittle64(size.bytes(), 0), 0x03FF01020304U);
+  EXPECT_EQ(loadLittle64(fetch.bytes(), 0), 0x000801020304U);
+
+  const auto buffer = DeviceBuffer::allocate(limits::kDeviceAllocationBytes);
+  EXPECT_EQ(buffer.bytes().size(), limits::kDeviceAllocationBytes);
+  EXPECT_EQ(reinterpret_cast<std::uintptr_t>(buffer.bytes().data()) % 65536, 0U);
+  EXPECT_TRUE(DeviceBuffer::allocate(0));
+  EXPECT_FALSE(DeviceBuffer::allocate(limits::kDeviceAllocationBytes + 1));
+}
+
+TEST(ConnectionTest, OpensConnections) {
+  const std::string noService = "Can't get ASP Connection, no matching service!\n";
+  const Dictionary good = driver({});
+  const struct {
+    Array services;
+    bool opens;
+    std::string error;
+  } kCases[] = {
+      {{}, false, noService},
+      {{good}, true, ""},
+      {{with(good, "OpenError", kKernelError)},
+       false,
+       "IOServiceOpen failed for class 'ASPStorage', result 0xe00002bc\n"
+       "Can't get ASP Connection!\n"},
+  };
+  for (const auto& c : kCases) {
+    StoragePlatform platform(c.services);
+    ASPConnection connection;
+    closeASPConnection(connection);
+    EXPECT_EQ(openASPConnection(platform.drivers, platform.streams, connection), c.opens);
+    EXPECT_EQ(connection.service != nullptr, c.opens);
+    for (int i = 0; i < 2; ++i) {
+      closeASPConnection(connection);
+      EXPECT_TRUE(!connection.service && !connection.connection);
+    }
+    EXPECT_EQ(platform.streams.error, c.error);
+  }
+
+  StoragePlatform none({}), stuck({with(good, "CloseError", kKernelError)});
+  const NandExporter* exporter = nullptr;
+  EXPECT_EQ(ANDConnect(none.drivers, none.streams, exporter), nullptr);
+  EXPECT_EQ(none.streams.error, "No class found");
+  ANDDisconnect(stuck.streams, ANDConnect(stuck.drivers, stuck.streams, exporter));
+  EXPECT_EQ(stuck.streams.error, "closing connection to service failed\n");
+}
+
+TEST(ConnectionTest, AsksForContentDeletion) {
+  const auto answer = [](const Dictionary& row) { return driver({with(row, "Method", 5)}); };
+  const Dictionary yes = answer({{"Output", Data(little32(0x01000000))}});
+  const struct {
+    Array services;
+    bool recommends;
+    std::string error;
+  } kCases[] = {
+      {{yes}, true, ""},
+      {{answer({{"Output", Data(little32(0))}})}, false, ""},
+      {{answer({{"Output", Data(little32(1))}, {"OutputLength", 3}})}, false, ""},
+      {{answer({{"Error", kKernelError}})}, false, ""},
+      {{with(driver({}, kNVMe), "OpenError", kKernelError)}, false, ""},
+      {{}, false, "_load_nand_infoCould not get matching Kernkit service for exporting classes\n"},
+      {{with(yes, "OpenError", 1)}, false, "Could not get connection to service\n"},
+      {{with(answer({{"Output", Data(little32(2))}}), "CloseError", 1)}, true, kCloseFailed},
+  };
+  for (const auto& c : kCases) {
+    StoragePlatform platform(c.services);
+    EXPECT_EQ(NandRecommendsContentDeletion(platform.drivers, platform.streams), c.recommends);
+    EXPECT_EQ(platform.streams.error, c.error);
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,159 @@
+#include <gtest/gtest.h>
+
+#include "storage/counter_parsers.h"
+#include "storage/hex_string.h"
+#include "tests/fakes/fake_platform.h"
+
+namespace tavrel {
+namespace {
+
+using fakes::FakeStreams;
+
+/// Which words the elements were taken from, "*n" for n elements that are 0; arrays that are all 0
+/// are left out. Word w of the block holds w + 1.
+std::string described(const TelemetryCounters& counters) {
+  std::string text;
+  for (const CounterArrayShape& shape : kCounterArrays) {
+    const auto array = counters[shape.array];
+    std::string line;
+    for (std::size_t i = 0, end = 0; i < array.size(); i = end) {
+      const std::uint32_t step = array[i] == 0 ? 0 : 1;
+      for (end = i + 1; end < array.size() && array[end] == array[end - 1] + step;)
+        ++end;
+      if (step == 0) {
+        line += end - i < array.size() ? format(" *%zu", end - i) : "";
+      } else {
+        line += format(" %u", array[i] - 1);
+        if (end - i > 1) line += format("-%u", array[end - 1] - 1);
+      }
+    }
+    if (!line.empty()) text += format("%s%s\n", shape.name, line);
+  }
+  return text;
+}
+
+TEST(CountersTest, CopiesByMap) {
+  const struct {
+    CounterParser parser;
+    const char* name;
+    std::string_view words;
+  } kCases[] = {
+      // clang-format off
+      {parseOnlyAlgoGenericCounters, "parseOnlyAlgoGenericCounters",
+       "readStage 0-18 37 117-118 91 *10\n"
+       "initialReadStage 20-27 19 116 90 120 119 *10\n"
+       "nandStageOfLife 28-35\n"
+       "dspExceptionParameter 104 38-44 89 105 114-115 *26\n"
+       "readStage18NumOfErrorsBin 45-56\n"
+       "readStage9NumOfErrorsBin 57-64 *2\n"
+       "readStage10NumOfErrorsBin 67-76\n"
+       "readStage17NumOfErrorsBin 77-86\n"
+       "readStage19NumOfErrorsBin 92-103\n"
+       "algoNANDAccessesBin 106-113\n"},
+      {parseOnlyAlgoGenericCountersK4, "parseOnlyAlgoGenericCountersK4",
+       "readStage 0-7 *1 9-18 27 105-106 79 *2 115-118 8 120-121 110\n"
+       "initialReadStage *8 19 104 78 108 107 122 *9\n"
+       "nandStageOfLife 20-22 *1 23-25 *1\n"
+       "dspExceptionParameter 92 28-29 *6 93 102-103 *1 30-32 77 112-114 126 123 94-98 *1 99-101 109 111 45-48 26\n"
+       "readStage18NumOfErrorsBin 33-44\n"
+       "readStage10NumOfErrorsBin 55-64\n"
+       "readStage17NumOfErrorsBin 65-74\n"
+       "readStage19NumOfErrorsBin 80-91\n"
+       "retentionIndication *2 75-76 *8\n"},
+      {parseCounters1y, "parseCounters1y",
+       "readStage 256-263 265 267-276 303 390-391 372 *10\n"
+       "initialReadStage 278-285 277 290 371 393 392 *10\n"
+       "nandStageOfLife 292-299\n"
+       "dspExceptionParameter 21 305-306 313-317 370 15 531-532 *26\n"
+       "readStage18NumOfErrorsBin 318-329\n"
+       "readStage9NumOfErrorsBin 330-337 *2\n"
+       "readStage10NumOfErrorsBin 338-347\n"
+       "readStage17NumOfErrorsBin 348-357\n"
+       "readStage19NumOfErrorsBin 373-384\n"},
+      {parseCounters1xSandisk, "parseCounters1xSandisk",
+       "readStage 256-261 *2 265 267-273 *1 275-276 301 *13\n"
+       "initialReadStage 278-283 *2 277 288 *13\n"
+       "nandStageOfLife 290-297\n"
+       "dspExceptionParameter 16 303-304 311-315 *1 10 *28\n"},
+      {parseCounters1xHynix, "parseCounters1xHynix",
+       "readStage 256-259 *4 263 265-271 *1 273-274 297 *13\n"
+       "initialReadStage 276-279 *4 275 284 *13\n"
+       "nandStageOfLife 286-293\n"
+       "dspExceptionParameter 16 299-300 307-311 *1 10 *28\n"},
+      // clang-format on
+  };
+  std::vector<std::byte> bytes(kCounterBlockBytes);
+  for (std::uint32_t word = 0; word < 1024; ++word)
+    storeLittle32(bytes, word * 4, word + 1);
+  const CounterBlock block(bytes.data(), kCounterBlockBytes);
+  TelemetryCounters counters;
+  counters.elements.fill(0xFFFFFFFF);
+  for (const auto& c : kCases) {
+    c.parser(block, counters);
+    EXPECT_EQ(described(counters), c.words);
+    EXPECT_EQ(counterParserName(c.parser), c.name);
+  }
+  parseCountersAlgoGeneric(block, counters);
+  EXPECT_EQ(described(counters), kCases[0].words);
+  parseCountersAlgoGenericK4(block, counters);
+  EXPECT_EQ(described(counters), kCases[1].words);
+}
+
+TEST(CountersTest, SelectsParsers) {
+  const struct {
+    const char* chip;
+    const char* manufacturer;
+    const char* parser;
+  } kCases[] = {
+      {"K3V", "4582603A5700", "parseCountersAlgoGeneric"},
+      {"K4V", "AD825223215F", "parseCountersAlgoGenericK4"},
+      {"K2V", "AD825223215F", "parseCounters1xHynix"},
+      {"K3", "ad82522321FF99", "parseCounters1xHynix"},
+      {"", "4582603A5700", "parseCounters1xSandisk"},
+      {"K3V1", "458260DE57EE", "parseCounters1xSandisk"},
+      {"", "4582603B5700", "parseCounters1y"},
+      {"", "AD82", "parseCounters1y"},
+      {"", "AD", "parseCounters1y"},
+      {"", "AD82522321", "parseCounters1y"},
+  };
+  FakeStreams streams;
+  for (const auto& c : kCases) {
+    const auto id = readManufacturerId(streams, c.manufacturer);
+    EXPECT_EQ(counterParserName(selectCounterParser(chipGeneration(c.chip), id.vendor, id.device)),
+              c.parser)
+        << c.chip << " " << c.manufacturer;
+  }
+  EXPECT_EQ(streams.output, "");
+}
+
+TEST(CountersTest, ReadsHexadecimal) {
+  const struct {
+    std::string_view text;
+    std::uint32_t number;
+    std::string output;
+  } kCases[] = {
+      {"", 0, ""},
+      {"7", 7, ""},
+      {"12345678", 0x12345678, ""},
+      {"123456789", 0x12345678, ""},
+      {"AD82", 0xAD82, ""},
+      {"abc", 0xAB0C, ""},
+      {"1G", 0x10, "unrecognized hex character: g"},
+      {"@G", 0, "unrecognized hex character: @unrecognized hex character: g"},
+      {{"\xC4\0F", 3},
+       0x0F,
+       {"unrecognized hex character: \xC4unrecognized hex character: \0", 58}},
+  };
+  for (const auto& c : kCases) {
+    FakeStreams streams;
+    EXPECT_EQ(hexStringToInt32(streams, c.text), c.number) << c.text;
+    EXPECT_EQ(streams.output, c.output);
+    EXPECT_EQ(streams.error, "");
+  }
+  FakeStreams streams;
+  EXPECT_EQ(hexStringToByte(streams, "fFz"), 0xFF);
+  EXPECT_EQ(streams.output, "");
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,80 @@
+// A storage driver of which a test says what it answers, and the buffers it answers with.
+#pragma once
+
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "platform/linux/recorded_registry.h"
+#include "tests/fakes/fake_platform.h"
+
+namespace tavrel::fakes {
+
+using Bytes = std::vector<std::byte>;
+
+struct Record {
+  std::uint32_t key;
+  std::vector<std::uint64_t> values;
+};
+
+inline void append64(Bytes& out, std::uint64_t value) {
+  out.resize(out.size() + 8);
+  storeLittle64(out, out.size() - 8, value);
+}
+
+inline Bytes statistics(const std::vector<Record>& records) {
+  Bytes out;
+  for (const auto& [key, values] : records) {
+    append64(out, key | static_cast<std::uint64_t>(values.size()) << 32);
+    for (const std::uint64_t value : values)
+      append64(out, value);
+  }
+  return out;
+}
+
+inline Bytes little32(std::uint32_t value) {
+  Bytes out(4);
+  storeLittle32(out, 0, value);
+  return out;
+}
+
+/// FNV-1a of the rows of a table, to pin what was compared with its source once.
+inline std::uint64_t fingerprint(std::string_view text) {
+  std::uint64_t hash = 0xCBF29CE484222325;
+  for (const char c : text)
+    hash = (hash ^ static_cast<unsigned char>(c)) * 0x100000001B3;
+  return hash;
+}
+
+/// A request of 24 bytes as the driver must see it.
+inline plist::Data request(std::uint8_t selector, std::uint8_t flags) {
+  Bytes bytes(24);
+  bytes[0] = std::byte{selector};
+  bytes[4] = std::byte{flags};
+  return plist::Data(bytes);
+}
+
+/// The methods that answer a query for statistics with `buffer`.
+inline plist::Array answering(const Bytes& buffer, int method = 8) {
+  return {plist::Dictionary{
+              {"Method", method},
+              {"Request", request(13, 1)},
+              {"Output", plist::Data(little32(static_cast<std::uint32_t>(buffer.size())))}},
+          plist::Dictionary{
+              {"Method", method}, {"Request", request(13, 0)}, {"Output", plist::Data(buffer)}}};
+}
+
+inline plist::Dictionary driver(const plist::Array& methods, const char* className = "ASPStorage") {
+  return {{"Class", className}, {"Methods", methods}};
+}
+
+/// A platform with recorded drivers.
+struct StoragePlatform : FakePlatform {
+  explicit StoragePlatform(const plist::Array& recorded)
+      : registry(plist::Dictionary{{"Services", recorded}}, log) {
+    drivers.behind = &registry;
+  }
+  RecordedRegistry registry;
+};
+
+}  // namespace tavrel::fakes

@@ -1,0 +1,303 @@
+#include "storage/structured_log.h"
+
+#include <gtest/gtest.h>
+
+#include "recorded_driver.h"
+#include "storage/structured_lists.h"
+
+namespace tavrel {
+namespace {
+
+using fakes::Bytes;
+using fakes::little32;
+using fakes::request;
+using fakes::StoragePlatform;
+using plist::Array;
+using plist::Data;
+using plist::Dictionary;
+using plist::Value;
+
+Bytes words(std::initializer_list<std::uint32_t> values) {
+  Bytes out;
+  for (const std::uint32_t value : values) {
+    const Bytes word = little32(value);
+    out.insert(out.end(), word.begin(), word.end());
+  }
+  return out;
+}
+
+/// Answers of a driver, one list at a time.
+struct Driver {
+  Array methods = Array::create();
+
+  void answer(std::uint8_t selector, const Bytes& list, std::uint8_t subList = 0) {
+    const auto flags = static_cast<std::uint8_t>(subList << 2);
+    const auto size = static_cast<std::uint32_t>(list.size());
+    query(selector, flags, {{"Output", Data(little32(size))}});
+    row(selector, flags, {{"Output", Data(list)}});
+  }
+  void query(std::uint8_t selector, std::uint8_t flags, const Dictionary& answer) {
+    row(selector, flags | 1, answer);
+  }
+  void row(std::uint8_t selector, std::uint8_t flags, const Dictionary& answer) {
+    Dictionary method = plist::mutableCopy(answer);
+    method.set("Method", 8);
+    method.set("Request", request(selector, flags));
+    methods.append(method);
+  }
+  Dictionary service(const Value& characteristics) const {
+    Dictionary service = fakes::driver(methods);
+    if (characteristics) service.set("Parents", Dictionary{{"IOService", 7}});
+    return service;
+  }
+  static Dictionary parent(const Value& characteristics) {
+    return {{"Class", "Bus"},
+            {"EntryID", 7},
+            {"Properties", Dictionary{{"Device Characteristics", characteristics}}}};
+  }
+};
+
+constexpr std::uint8_t kStatistics = 13, kBands = 11, kDefects = 15, kTelemetry = 17;
+
+// 2.5 block writes per host write, 0.75 within the intermediate bands.
+const fakes::Bytes kStatisticsBuffer = fakes::statistics(
+    {{49, {4096}}, {50, {1}}, {20, {5}}, {4, {2}}, {129, {3}}, {84, {9}}, {129, {1}}, {84, {1}}});
+
+TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
+  const Bytes list = [] {
+    Bytes bytes = words({5, 1, 0, 0, 0});
+    for (const auto& [bucket, value] : {std::pair(3U, -1), {16U, 8}, {0U, 7}, {3U, 4}, {15U, 1}}) {
+      const Bytes record = words({bucket, static_cast<std::uint32_t>(value), 0, 0, 0});
+      bytes.insert(bytes.end(), record.begin(), record.end());
+    }
+    return bytes;
+  }();
+  const std::string kText =
+      " tavrel[211]: IntermediateWamp:0.50;UserWamp:2.50;ValidityList[0]:7;ValidityList[3]:-1,4;"
+      "ValidityList[15]:1\n";
+  const struct {
+    Value preference;
+    bool forced, logged;
+  } kCases[] = {{{}, false, true},   {3.0, false, false}, {2.5F, false, false}, {2.25, false, true},
+                {12.0, false, true}, {0.0, false, true},  {3, false, true},     {3.0, true, true}};
+  for (const auto& c : kCases) {
+    Driver driver;
+    driver.answer(kStatistics, kStatisticsBuffer);
+    driver.answer(kBands, list);
+    StoragePlatform platform({driver.service(1), Driver::parent(1)});
+    platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", c.preference);
+    gForceCollectionSet = c.forced;
+    DumpStorageStructuredLog(platform.platform, false);
+    gForceCollectionSet = false;
+    EXPECT_EQ(gNeedValidityList, c.logged) << textOf(c.preference);
+    EXPECT_EQ(gCurrentUserWamp, 2.5);
+    EXPECT_EQ(gCurrentSysWamp, 0.5);
+    ASSERT_EQ(platform.submission.logs.size(), c.logged ? 1U : 0U);
+    if (!c.logged) continue;
+    EXPECT_EQ(platform.submission.logs[0].type, "165");
+    EXPECT_TRUE(platform.submission.logs[0].content.ends_with(kText))
+        << platform.submission.logs[0].content;
+  }
+  // One byte less than the records need, counts that would wrap, no records, no header.
+  StoragePlatform platform(Array::create());
+  gNeedValidityList = true;
+  for (const Bytes& bad : {Bytes(list.begin(), list.end() - 1), words({1, ~0U, 0, 0, 0}),
+                           words({~0U, 0, 0}), words({0, 0, 0}), words({1})}) {
+    platform.streams.error.clear();
+    EXPECT_FALSE(logValidityList(platform.platform, bad, {}));
+    EXPECT_EQ(platform.streams.error, "data cannot be parsed");
+  }
+  gNeedValidityList = false;
+}
+
+TEST(StructuredLogTest, HasInfiniteAmplificationWithoutHostWrites) {
+  Driver driver;
+  driver.answer(kStatistics, fakes::statistics({{49, {4096}}, {50, {1}}, {20, {5}}}));
+  StoragePlatform platform({driver.service(1), Driver::parent(1)});
+  platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 9.5);
+  DumpStorageStructuredLog(platform.platform, false);
+  EXPECT_TRUE(gNeedValidityList);
+  // Without statistics both are unknown.
+  StoragePlatform without(Array{});
+  EXPECT_FALSE(DumpStorageStructuredLog(without.platform, false));
+  EXPECT_FALSE(gNeedValidityList);
+  EXPECT_EQ(gCurrentUserWamp, 0);
+}
+
+TEST(StructuredLogTest, SaysWhatFails) {
+  constexpr const char* kNoService =
+      "Could not get matching Kernkit service for exporting classes\n";
+  const std::string kStatisticsFailed = "IOConnectCallStructMethod: -536870206";
+  const auto failedQueries = [](std::initializer_list<int> indexes) {
+    std::string text;
+    for (const int index : indexes) {
+      appendFormat(text,
+                   "IOConnectCallStructMethod failed with status 0xe00002c2 on selector "
+                   "index %d\n",
+                   index);
+    }
+    return text;
+  };
+  const Dictionary characteristics{
+      {"chip-id", "K3V"}, {"manufacturer-id", "AD825223215F"}, {"num-bus", 0}};
+  const auto run = [&](const Driver& driver, const Value& under, bool result,
+                       const std::string& error) {
+    StoragePlatform platform({driver.service(under), Driver::parent(under)});
+    EXPECT_EQ(DumpStorageStructuredLog(platform.platform, false), result) << error;
+    EXPECT_EQ(platform.streams.error, error);
+  };
+  {
+    StoragePlatform platform(Array{});
+    EXPECT_FALSE(DumpStorageStructuredLog(platform.platform, false));
+    EXPECT_EQ(platform.streams.error, std::string(kNoService) + kNoService);
+  }
+  run({}, {}, false, kStatisticsFailed + "failed to create dictionary");
+  // Queries that fail do not count; nor do fetches.
+  run({}, characteristics, true, kStatisticsFailed + failedQueries({0, 1, 2, 3, 4}));
+  Driver driver;
+  driver.query(kBands, 0, {{"Output", Data(little32(0))}});
+  driver.query(kTelemetry, 0, {{"Output", Data(little32(~0U))}});
+  driver.query(kTelemetry, 4, {{"Output", Data(little32(8))}});
+  driver.answer(kDefects, words({0, 1, 0}));
+  run(driver, characteristics, false,
+      kStatisticsFailed + "Could not malloc 4294967295 bytes" +
+          "Could not retrieve data from driver for selector 17\n" + failedQueries({3}));
+  // What a driver's row has no getter for is not asked.
+  {
+    StoragePlatform platform({driver.service(characteristics), Driver::parent(characteristics)});
+    EXPECT_TRUE(logStorageLists(platform.platform, *platform.drivers.firstService("ASPStorage"),
+                                {.characteristicsProperty = "Device Characteristics"}, false));
+    EXPECT_EQ(platform.streams.error,
+              "Validity list retrieval is not supported\n"
+              "Telemetry list retrieval is not supported\n"
+              "Defects list retrieval is not supported\n");
+  }
+  // The caller's flag goes along with both steps.
+  Driver flagged;
+  flagged.answer(kStatistics, kStatisticsBuffer);
+  flagged.query(kDefects, 2, {{"Output", Data(little32(12))}});
+  flagged.row(kDefects, 2, {{"Output", Data(words({0, 9, 0}))}});
+  StoragePlatform platform({flagged.service(1), Driver::parent(1)});
+  EXPECT_TRUE(DumpStorageStructuredLog(platform.platform, true));
+  ASSERT_EQ(platform.crashReporting.records.size(), 1U);
+  EXPECT_EQ(platform.crashReporting.records[0].second, (Dictionary{{"Factory Count", 9}}));
+}
+
+TEST(StructuredLogTest, RefusesTelemetryThatItCannotPlace) {
+  const Dictionary good{{"chip-id", "K3V"}, {"manufacturer-id", "AD825223215F"}, {"num-bus", 1}};
+  const auto with = [&](const char* key, const Value& value) {
+    Dictionary changed = plist::mutableCopy(good);
+    changed.set(key, value);
+    return Value(changed);
+  };
+  const std::string bounds = "ERROR: Attempting to parse beyond the bounds of the buffer\n";
+  const struct {
+    Value characteristics;
+    std::size_t size;
+    std::string error;
+    std::string output = {};
+  } kCases[] = {
+      {"text", 4128, "ERROR: Could not parse the Device Characteristics dictionary\n"},
+      {with("chip-id", {}), 4128, "ERROR: Could not determine the chip-id\n"},
+      {with("chip-id", 5), 4128, "ERROR: chip-id is not stored as a CFStringTypeID\n"},
+      {with("chip-id", std::string(64, 'K')), 4128,
+       "ERROR: Unable to obtain chip-id as conversion from the UniChar contents of CFString failed,"
+       " or the buffer of 64 bytes is too small\n"},
+      {with("manufacturer-id", {}), 4128, "ERROR: Could not determine the manufacturer-id\n"},
+      {with("manufacturer-id", true), 4128,
+       "ERROR: manufacturer-id is not stored as a CFStringTypeID\n"},
+      {with("num-bus", {}), 4128, "ERROR: could not determine the number of channels\n"},
+      {with("num-bus", "1"), 4128, "ERROR: could not determine the number of channels\n"},
+      {Dictionary{{"chip-id", ""}, {"manufacturer-id", "1G"}}, 0,
+       "ERROR: could not determine the number of channels\n", "unrecognized hex character: g"},
+      {good, 4127, bounds},
+      {with("num-bus", INT32_MAX), 4128, bounds},
+      {good, 4128, ""},
+      {with("chip-id", std::string(63, 'K')), 4128, ""},
+      {with("num-bus", -1), 0, ""},
+      {with("num-bus", 0), 0, ""},
+  };
+  for (const auto& c : kCases) {
+    StoragePlatform platform(Array{});
+    EXPECT_EQ(logTelemetryList(platform.platform, Bytes(c.size), c.characteristics),
+              c.error.empty())
+        << c.error;
+    EXPECT_EQ(platform.streams.error, c.error);
+    EXPECT_EQ(platform.streams.output, c.output);
+    EXPECT_EQ(platform.crashReporting.records.size(), c.error.empty() && c.size != 0 ? 1U : 0U);
+  }
+}
+
+TEST(StructuredLogTest, FilesOneRecordPerChannel) {
+  // Word n of channel c's block is 1000 c + n, field n of its record 100 c + n.
+  constexpr std::uint32_t kChannels = 2;
+  Bytes list;
+  for (std::uint32_t word = 0; word < kChannels * 1024; ++word) {
+    const Bytes bytes = little32(1000 * (word / 1024) + word % 1024);
+    list.insert(list.end(), bytes.begin(), bytes.end());
+  }
+  for (std::uint32_t field = 0; field < kChannels * 8; ++field) {
+    const Bytes bytes = little32(100 * (field / 8) + field % 8);
+    list.insert(list.end(), bytes.begin(), bytes.end());
+  }
+  const struct {
+    const char* chip;
+    std::size_t entries;
+    std::vector<std::pair<const char*, int>> values;  // of the second channel
+  } kCases[] = {
+      {"K3V",
+       7 + 23 + 23 + 8 + 12 + 12 + 10 + 10 + 10 + 12 + 8,
+       {{"RD", 100},
+        {"num_pages", 106},
+        {"readStage[22]", 1091},
+        {"algoNANDAccessesBin[7]", 1113}}},
+      {"K4V",
+       7 + 33 + 23 + 8 + 38 + 12 + 10 + 10 + 10 + 12 + 12,
+       {{"block_type", 105},
+        {"readStage[32]", 1110},
+        {"dspExceptionParameter[37]", 1026},
+        {"retentionIndication[3]", 1076},
+        {"retentionIndication[11]", 0}}},
+      {"other",
+       7 + 23 + 23 + 8 + 12 + 12 + 10 + 10 + 10 + 12,
+       {{"Max_PE_rate", 102}, {"readStage[0]", 1256}, {"readStage19NumOfErrorsBin[11]", 0}}},
+  };
+  for (const auto& c : kCases) {
+    StoragePlatform platform(Array{});
+    const Dictionary characteristics{
+        {"chip-id", c.chip}, {"manufacturer-id", "AD825223215F"}, {"num-bus", kChannels}};
+    EXPECT_TRUE(logTelemetryList(platform.platform, list, characteristics));
+    const auto& records = platform.crashReporting.records;
+    ASSERT_EQ(records.size(), kChannels) << c.chip;
+    EXPECT_EQ(records[1].first, 176U);
+    EXPECT_EQ(records[1].second.size(), c.entries) << c.chip;
+    for (const auto& [key, value] : c.values)
+      EXPECT_EQ(records[1].second.get(key), Value(value)) << c.chip << ' ' << key;
+  }
+}
+
+TEST(StructuredLogTest, FilesDefectsThatLieInTheBuffer) {
+  Bytes list = words({0, 3, 2});
+  const Bytes defect = words({0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB});
+  list.insert(list.end(), defect.begin(), defect.end());
+  list.insert(list.end(), defect.begin(), defect.end() - 1);
+  StoragePlatform platform(Array{});
+  EXPECT_TRUE(logDefectsList(platform.platform, list, {}));
+  EXPECT_TRUE(logDefectsList(platform.platform, words({0}), {}));
+  EXPECT_TRUE(logDefectsList(platform.platform, words({0, 4}), {}));
+  const auto& records = platform.crashReporting.records;
+  ASSERT_EQ(records.size(), 3U);
+  EXPECT_EQ(records[2].second, (Dictionary{{"Factory Count", 4}}));
+  EXPECT_EQ(records[0].second, (Dictionary{{"Factory Count", 3}}));
+  EXPECT_EQ(records[1].second, (Dictionary{{"Bus", 1},
+                                           {"CE", 65535},
+                                           {"CAU", 2},
+                                           {"Block", -1},
+                                           {"Cycle", 4},
+                                           {"Reason", 5},
+                                           {"Page", 6},
+                                           {"Temperature", -5}}));
+}
+
+}  // namespace
+}  // namespace tavrel
