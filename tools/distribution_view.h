@@ -1,8 +1,11 @@
-// The summaries and histograms of a tallied log, read back.
+// The summaries and histograms of a tallied log, read back; histograms as bars.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
+#include <iosfwd>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -28,6 +31,10 @@ struct DistributionView {
   /// The root of the mean squared deviation; nothing when nothing was counted.
   std::optional<double> standardDeviation() const;
 };
+
+/// One line a bucket: label, count, and a bar in proportion to the largest count.
+void printBuckets(std::ostream& out, std::span<const DistributionView::Bucket> buckets,
+                  std::optional<std::size_t> columns);
 
 /// Whether an entry of "BHDistributions" is a summary: minimum, maximum, mean, squared deviations,
 /// count.

@@ -2,11 +2,8 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
-#include <cmath>
 #include <memory>
 #include <ostream>
-#include <sys/stat.h>
-#include <tuple>
 #include <vector>
 
 #include "base/arithmetic.h"
@@ -18,6 +15,7 @@
 #include "platform/plist/coding.h"
 #include "report/bh_report.h"
 #include "tools/day_argument.h"
+#include "tools/filed_logs.h"
 #include "tools/json_value.h"
 #include "tools/log_document.h"
 #include "tools/log_faults.h"
@@ -27,22 +25,6 @@
 namespace tavrel {
 namespace {
 
-/// A log, with what the file system knows of its file.
-struct FiledLog : FileSubmission::FiledLog {
-  std::optional<struct stat> status;  // nothing when it cannot be told
-};
-
-// The order in which logs were filed. Metadata tells the second, the file the rest.
-bool isOlder(const FiledLog& a, const FiledLog& b) {
-  const auto order = [](const FiledLog& log) {
-    const auto time = log.metadata.date(kLogMetadataTime);
-    const timespec modified = log.status ? log.status->st_mtim : timespec{};
-    return std::tuple(time ? std::floor(time->secondsSinceEpoch()) : -HUGE_VAL, modified.tv_sec,
-                      modified.tv_nsec);
-  };
-  return order(a) < order(b);
-}
-
 struct Arguments {
   std::string file = "latest";
   std::string day;
@@ -50,50 +32,8 @@ struct Arguments {
   bool verbose = false;
 };
 
-std::string_view nameOf(FileSubmission::Place place) {
-  return place == FileSubmission::Place::Pending ? "pending" : "outbox";
-}
-
-std::string fileNameOf(const FiledLog& log) {
-  return log.path.substr(log.path.rfind('/') + 1);
-}
-
-/// The logs of both folders, oldest first.
-Expected<std::vector<FiledLog>> filedLogs(ToolContext& context) {
-  FileSubmission& submission = context.linuxPlatform().submission();
-  std::vector<FiledLog> logs;
-  for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
-    auto found = submission.logs(place);
-    if (!found) return found.error();
-    for (FileSubmission::FiledLog& log : *found) {
-      auto status = FileLayer::status(log.path);
-      if (status && !S_ISREG(status->st_mode)) continue;
-      logs.push_back({std::move(log), status});
-    }
-  }
-  std::stable_sort(logs.begin(), logs.end(), isOlder);
-  return logs;
-}
-
 std::string textIn(const plist::Dictionary& metadata, std::string_view key) {
   return std::string(metadata.string(key).value_or("?"));
-}
-
-// Says once why logs stand without metadata.
-void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs) {
-  const auto isBare = [](const FiledLog& log) { return log.metadata.empty(); };
-  const auto first = std::find_if(logs.begin(), logs.end(), isBare);
-  if (first == logs.end()) return;
-  const std::string path =
-      first->path.substr(0, first->path.rfind('/') + 1) + first->name + ".metadata.plist";
-  const auto bytes = context.linuxPlatform().fileLayer().read(path, limits::kPropertyListBytes);
-  const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
-  std::string reason = value ? path + ": it is empty or no dictionary" : value.error().message;
-  if (bytes && !value) reason = path + ": " + reason;
-  context.note(format(
-      "%s without metadata: %s",
-      counted(static_cast<std::uint64_t>(std::count_if(logs.begin(), logs.end(), isBare)), "log"),
-      reason));
 }
 
 void list(ToolContext& context) {
@@ -122,14 +62,20 @@ void list(ToolContext& context) {
   noteMissingMetadata(context, *logs);
 }
 
-/// The log that `name` means: "latest", the name of a filed log, or a path of this machine.
+bool isDaily(const FiledLog& log) {
+  return log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName);
+}
+
+/// The log that `name` means: "latest" (of the daily logs), the name of a filed log, or a path of
+/// this machine.
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   const auto logs = filedLogs(context);
   const bool isLatest = name == "latest";
   if (!logs && isLatest) return logs.error();
   if (logs) {
     for (auto log = logs->rbegin(); log != logs->rend(); ++log) {
-      if (isLatest || name == log->path || name == log->name || name == fileNameOf(*log)) {
+      if ((isLatest && isDaily(*log)) || name == log->path || name == log->name ||
+          name == fileNameOf(*log)) {
         return LogEnvelope{std::string(nameOf(log->place)), log->path, log->metadata};
       }
     }
@@ -183,11 +129,6 @@ void show(ToolContext& context, const Arguments& arguments) {
   showText(context, *envelope, *bytes);
 }
 
-std::string_view nameOf(LogLevel level) {
-  constexpr std::string_view kNames[] = {"debug", "info", "default", "error"};
-  return kNames[static_cast<std::size_t>(level)];
-}
-
 plist::Dictionary metadataOf(Platform& platform, const CapturedLog& log) {
   plist::Dictionary metadata{{kLogMetadataType, log.type},
                              {kLogMetadataName, log.name},
@@ -201,11 +142,13 @@ void preview(ToolContext& context, const Arguments& arguments) {
   Platform& platform = overlay.platform();
   // A document that lacks something must not pass for the whole.
   std::vector<std::string> errors;
-  overlay.setLineHandler([&](const CapturedLine& line) {
+  overlay.setEventHandler([&](const OverlayEvent& event) {
+    if (event.kind != OverlayEvent::Kind::LogLine) return;
+    const std::string_view message = *event.value.string();
     if (arguments.verbose) {
-      context.error() << nameOf(line.level) << ": " << printable(line.message) << '\n';
-    } else if (line.level == LogLevel::Error) {
-      errors.push_back(line.message);
+      context.error() << event.subject << ": " << printable(message) << '\n';
+    } else if (event.subject == "error") {
+      errors.emplace_back(message);
     }
   });
   const std::int32_t today = platform.statistics.BHDaysSince1970();
@@ -262,7 +205,9 @@ void addLogCommands(CLI::App& app, ToolContext& context) {
   listCommand->callback([&context] { list(context); });
 
   auto* showCommand = group->add_subcommand("show", "Show a submitted log");
-  showCommand->add_option("FILE", arguments->file, "A log of 'log list', a path, or latest")
+  showCommand
+      ->add_option("FILE", arguments->file,
+                   "A log of 'log list', a path, or latest, the last daily one")
       ->capture_default_str();
   auto* raw = showCommand->add_flag("--raw", arguments->raw, "Print the log's bytes as they are");
   context.addJsonOption(*showCommand);

@@ -17,9 +17,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::size_t kWidestBar = 40;
-constexpr std::size_t kNarrowestBar = 8;
-constexpr std::size_t kColumnsInPipe = 80;
 constexpr std::size_t kPlainDigits = 10;
 
 void printField(std::ostream& out, std::string_view name, std::string_view text) {
@@ -74,21 +71,7 @@ void printValues(std::ostream& out, std::string_view title, const plist::Diction
 void printHistogram(std::ostream& out, const DistributionView& view,
                     std::optional<std::size_t> columns) {
   out << format("\nHistogram of %s\n", printable(view.key));
-  std::uint64_t largest = 0;
-  std::size_t labelWidth = 0;
-  for (const auto& bucket : view.buckets) {
-    largest = std::max(largest, bucket.count);
-    labelWidth = std::max(labelWidth, displayWidth(printable(bucket.label)));
-  }
-  const std::size_t taken = 2 + labelWidth + 2 + std::to_string(largest).size() + 2;
-  const std::size_t width = columns.value_or(kColumnsInPipe);
-  const std::size_t barWidth =
-      std::clamp(width > taken ? width - taken : 0, kNarrowestBar, kWidestBar);
-  Table table({{""}, {"", Table::Align::Right}, {""}}, 2);
-  for (const auto& bucket : view.buckets) {
-    table.add({bucket.label, std::to_string(bucket.count), bar(bucket.count, largest, barWidth)});
-  }
-  table.print(out, std::nullopt);
+  printBuckets(out, view.buckets, columns);
 }
 
 void printDistributions(std::ostream& out, const std::vector<DistributionView>& views,

@@ -1,237 +1,118 @@
 #include "tools/overlay_platform.h"
 
-#include <map>
+#include <cerrno>
+#include <fcntl.h>
 #include <utility>
 
 #include "base/limits.h"
+#include "platform/linux/file_crash_reporting.h"
+#include "platform/linux/file_device_answers.h"
+#include "platform/linux/file_preferences.h"
+#include "platform/linux/file_submission.h"
+#include "platform/linux/linux_applications.h"
+#include "platform/linux/linux_dynamic_loader.h"
+#include "platform/linux/linux_files.h"
+#include "platform/linux/linux_locale.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/linux_system_controls.h"
+#include "platform/linux/linux_system_version.h"
+#include "platform/linux/recorded_registry.h"
 #include "platform/linux/sqlite_store.h"
+#include "platform/plist/coding.h"
+#include "tools/overlay_drivers.h"
+#include "tools/overlay_reads.h"
 
 namespace tavrel {
 namespace {
 
-class OverlayLog final : public SystemLog {
- public:
-  void write(LogLevel level, std::string_view message) override {
-    if (level == LogLevel::Error) lastError = message;
-    if (handler) handler({level, std::string(message)});
+// What is below an overlay could not change a file if it tried.
+class ReadOnlyFileLayer final : public FileLayer {
+ protected:
+  int openFile(const char* path, int flags, mode_t mode) override {
+    const bool isReading = (flags & (O_ACCMODE | O_CREAT)) == O_RDONLY;
+    return isReading ? FileLayer::openFile(path, flags, mode) : refuse();
   }
-
-  OverlayPlatform::LineHandler handler;
-  std::string lastError;
-};
-
-class OverlayPreferences final : public Preferences {
- public:
-  explicit OverlayPreferences(Preferences& below) : below_(below) {}
-
-  plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) override {
-    const auto at = written_.find(std::pair(std::string(domain), std::string(key)));
-    return at == written_.end() ? below_.ZTXPreferencesGetValue(key, domain) : deepCopy(at->second);
-  }
-  void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
-                              std::string_view domain) override {
-    written_[std::pair(std::string(domain), std::string(key))] = deepCopy(value);
-  }
-  bool ZTXPreferencesSynchronize(std::string_view) override { return true; }
+  int truncateFile(int, off_t) override { return refuse(); }
+  int renameFile(const char*, const char*) override { return refuse(); }
+  int removeFile(const char*) override { return refuse(); }
+  int makeFolder(const char*, mode_t) override { return refuse(); }
 
  private:
-  Preferences& below_;
-  std::map<std::pair<std::string, std::string>, plist::Value> written_;  // by domain and key
-};
-
-class OverlayFiles final : public Files {
- public:
-  explicit OverlayFiles(Files& below) : below_(below) {}
-
-  Expected<std::string> read(std::string_view path, std::size_t largest) override {
-    const auto at = replaced.find(path);
-    if (at == replaced.end()) return below_.read(path, largest);
-    if (at->second.size() > largest) return Error{std::string(path) + ": the file is too large"};
-    return at->second;
+  static int refuse() {
+    errno = EROFS;
+    return -1;
   }
-  std::optional<std::int64_t> size(std::string_view path) override {
-    const auto at = replaced.find(path);
-    if (at == replaced.end()) return below_.size(path);
-    return static_cast<std::int64_t>(at->second.size());
-  }
-
-  std::map<std::string, std::string, std::less<>> replaced;
-
- private:
-  Files& below_;
-};
-
-class CapturedFile final : public LogFile {
- public:
-  explicit CapturedFile(std::string& bytes) : bytes_(bytes) {}
-  void write(ByteSpan bytes) override { bytes_ += asText(bytes); }
-
- private:
-  std::string& bytes_;
-};
-
-class OverlaySubmission final : public SubmissionService {
- public:
-  explicit OverlaySubmission(SubmissionService& below) : below_(below) {}
-
-  bool isDiagnosticSubmissionEnabled() override { return below_.isDiagnosticSubmissionEnabled(); }
-  bool hasInternalDiagnostics(std::string_view identifier) override {
-    return below_.hasInternalDiagnostics(identifier);
-  }
-  bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
-                                const plist::Dictionary& options,
-                                const LogWriter& writer) override {
-    CapturedLog log{std::string(logType), std::string(logName), options, {}};
-    CapturedFile file(log.bytes);
-    writer(file);
-    logs.push_back(std::move(log));
-    return true;
-  }
-  std::string ZTXOSVersion() override { return below_.ZTXOSVersion(); }
-  plist::Value ZTXGetDATaskingValue(std::string_view key) override {
-    return below_.ZTXGetDATaskingValue(key);
-  }
-  void submitDiagnosticLogs() override {}
-
-  std::vector<CapturedLog> logs;
-
- private:
-  SubmissionService& below_;
-};
-
-class OverlayStore final : public StatisticsStore {
- public:
-  explicit OverlayStore(StatisticsStore& below) : below_(below) {}
-
-  std::int32_t BHDaysSince1970() override { return below_.BHDaysSince1970(); }
-  plist::Date dateForDaysSince1970(std::int32_t day) override {
-    return below_.dateForDaysSince1970(day);
-  }
-  void BHClientCheckpoint() override {}
-  void BHClientSetValueForScalarKey(std::string_view, std::int64_t) override {}
-  std::unique_ptr<BHHistory> initWithDefaultPath() override { return below_.initWithDefaultPath(); }
-
- private:
-  StatisticsStore& below_;
-};
-
-class OverlayCrashReporting final : public CrashReporting {
- public:
-  explicit OverlayCrashReporting(CrashReporting& below) : below_(below) {}
-
-  void FLLogStructuredData(std::uint32_t, const plist::Dictionary&) override {}
-  void FLDumpAllOldStructuredDataLogs() override {}
-  void rollNorvaneCareLogs() override {}
-  std::string systemIdentifier() override { return below_.systemIdentifier(); }
-  std::string hardwareModel() override { return below_.hardwareModel(); }
-  std::string osVersion() override { return below_.osVersion(); }
-  std::string incidentIdentifier() override { return below_.incidentIdentifier(); }
-
- private:
-  CrashReporting& below_;
-};
-
-class OverlayNotifications final : public Notifications {
- public:
-  void post(std::string_view) override {}
-};
-
-// Functions of libraries that reach preferences reach those of the overlay.
-class OverlayLibrary final : public DynamicLibrary {
- public:
-  OverlayLibrary(std::unique_ptr<DynamicLibrary> below, Preferences& preferences)
-      : below_(std::move(below)), preferences_(preferences) {}
-
-  LibraryFunction find(std::string_view function) override {
-    const LibraryFunction found = below_->find(function);
-    Preferences& preferences = preferences_;
-    if (std::holds_alternative<IntegerPreferenceGetter>(found)) {
-      return IntegerPreferenceGetter([&preferences](std::string_view key, std::string_view domain) {
-        return preferences.ZTXPreferencesGetIntegerValue(key, domain);
-      });
-    }
-    if (std::holds_alternative<PreferenceSetter>(found)) {
-      return PreferenceSetter(
-          [&preferences](std::string_view key, const plist::Value& value, std::string_view domain) {
-            preferences.ZTXPreferencesSetValue(key, value, domain);
-          });
-    }
-    return found;
-  }
-
- private:
-  std::unique_ptr<DynamicLibrary> below_;
-  Preferences& preferences_;
-};
-
-class OverlayLoader final : public DynamicLoader {
- public:
-  OverlayLoader(DynamicLoader& below, Preferences& preferences)
-      : below_(below), preferences_(preferences) {}
-
-  std::unique_ptr<DynamicLibrary> load(std::string_view path) override {
-    auto library = below_.load(path);
-    if (!library) return nullptr;
-    return std::make_unique<OverlayLibrary>(std::move(library), preferences_);
-  }
-
- private:
-  DynamicLoader& below_;
-  Preferences& preferences_;
 };
 
 }  // namespace
 
-// The store is a second reader of the device's file, so that what it has to say and to count goes
-// to the overlay too.
+// Readers of the device's files of its own, so that what they have to say goes to the overlay too.
+// Each stands before the overlay over it.
 struct OverlayPlatform::Services {
   explicit Services(LinuxPlatform& linuxBelow)
-      : below(linuxBelow.platform()),
-        preferences(below.preferences),
-        files(below.files),
-        submission(below.submission),
-        crashReporting(below.crashReporting),
-        loader(below.dynamicLoader, preferences),
-        reader(linuxBelow.root(), below.clock, preferences, log, limits::kStoreBusyMilliseconds,
-               true),
-        store(reader) {}
+      : below(linuxBelow.platform()), root(linuxBelow.root()) {}
 
   Platform& below;
-  OverlayLog log;
-  OverlayPreferences preferences;
-  OverlayFiles files;
-  OverlaySubmission submission;
-  OverlayCrashReporting crashReporting;
-  OverlayNotifications notifications;
-  OverlayLoader loader;
-  SqliteStore reader;
-  OverlayStore store;
+  const DeviceRoot& root;
+  OverlayEvents events;
+  OverlayLog log{events};
+  OverlayStreams streams{events};
+  ReadOnlyFileLayer layer;
+  plist::PlistCoding propertyLists;
+
+  FilePreferences filePreferences{root, layer, propertyLists, below.clock, log};
+  OverlayPreferences preferences{filePreferences, events};
+  LinuxFiles linuxFiles{root, layer};
+  OverlayFiles files{linuxFiles, events};
+  LinuxSystemVersion linuxVersion{root, layer, propertyLists, log};
+  OverlaySystemVersion systemVersion{linuxVersion, events};
+  FileSubmission fileSubmission{root,        layer, propertyLists, preferences, linuxVersion,
+                                below.clock, log};
+  OverlaySubmission submission{fileSubmission, events};
+  FileCrashReporting fileCrashReporting{root, layer, linuxVersion, below.clock, log};
+  OverlayCrashReporting crashReporting{fileCrashReporting, events};
+  FileDeviceAnswers fileAnswers{root, layer, propertyLists, log};
+  OverlayAnswers answers{fileAnswers, events};
+  LinuxSystemControls linuxControls{root, layer, propertyLists, log, EccEvents::Mode::Peek};
+  OverlayControls systemControls{linuxControls, events};
+  LinuxApplications linuxApplications{root, log};
+  OverlayApplications applications{linuxApplications, events};
+  LinuxLocale linuxLocale{root, log};
+  OverlayLocale locale{linuxLocale, events};
+  LinuxDynamicLoader linuxLoader{root, layer, propertyLists, log, preferences};
+  OverlayLoader loader{linuxLoader, preferences, events};
+  RecordedRegistry recordedDrivers{root, layer, propertyLists, log};
+  OverlayDrivers drivers{recordedDrivers, events};
+  SqliteStore sqliteStore{root, below.clock, preferences, log, limits::kStoreBusyMilliseconds,
+                          true};
+  OverlayStore store{sqliteStore, events};
+  OverlayNotifications notifications{events};
   ProcessState state;
+
   Platform platform{
-      .applications = below.applications,
+      .applications = applications,
       .clock = below.clock,
       .crashReporting = crashReporting,
       .dateFormatting = below.dateFormatting,
-      .deviceAnswers = below.deviceAnswers,
+      .deviceAnswers = answers,
       .digest = below.digest,
-      .drivers = below.drivers,
+      .drivers = drivers,
       .dynamicLoader = loader,
       .eventLoop = below.eventLoop,
       .files = files,
-      .locale = below.locale,
+      .locale = locale,
       .log = log,
       .namedServices = below.namedServices,
       .notifications = notifications,
       .preferences = preferences,
       .process = below.process,
-      .propertyLists = below.propertyLists,
+      .propertyLists = propertyLists,
       .stackSnapshots = below.stackSnapshots,
-      .standardStreams = below.standardStreams,
+      .standardStreams = streams,
       .statistics = store,
       .submission = submission,
-      .systemControls = below.systemControls,
-      .systemVersion = below.systemVersion,
+      .systemControls = systemControls,
+      .systemVersion = systemVersion,
       .state = state,
   };
 };
@@ -244,8 +125,8 @@ Platform& OverlayPlatform::platform() {
   return services_->platform;
 }
 
-void OverlayPlatform::setLineHandler(LineHandler handler) {
-  services_->log.handler = std::move(handler);
+void OverlayPlatform::setEventHandler(OverlayEvents::Handler handler) {
+  services_->events.setHandler(std::move(handler));
 }
 
 void OverlayPlatform::replaceFile(std::string path, std::string content) {

@@ -9,38 +9,21 @@
 // The platform below must outlive it.
 #pragma once
 
-#include <functional>
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
 
-#include "base/plist.h"
 #include "platform/platform.h"
+#include "tools/overlay_events.h"
+#include "tools/overlay_writes.h"
 
 namespace tavrel {
 
 class LinuxPlatform;
 
-/// A log that was handed to the submission service.
-struct CapturedLog {
-  std::string type;
-  std::string name;
-  plist::Dictionary options;  // an empty handle for none
-  std::string bytes;
-};
-
-/// An entry of the system log.
-struct CapturedLine {
-  LogLevel level;
-  std::string message;
-};
-
 class OverlayPlatform {
  public:
-  using LineHandler = std::function<void(const CapturedLine&)>;
-
   explicit OverlayPlatform(LinuxPlatform& below);
   ~OverlayPlatform();
   OverlayPlatform(const OverlayPlatform&) = delete;
@@ -48,8 +31,9 @@ class OverlayPlatform {
 
   Platform& platform();
 
-  /// Called for each entry of the system log as it is written.
-  void setLineHandler(LineHandler handler);
+  /// Called for everything that is read, would be written, or is said, as it happens. The handler
+  /// must not use the platform.
+  void setEventHandler(OverlayEvents::Handler handler);
   /// Makes `content` the content of the device's file at `path`.
   void replaceFile(std::string path, std::string content);
 

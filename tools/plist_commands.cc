@@ -1,19 +1,15 @@
 #include "tools/plist_commands.h"
 
 #include <CLI/CLI.hpp>
-#include <cerrno>
-#include <cstring>
-#include <filesystem>
 #include <memory>
 #include <ostream>
 
 #include "base/format.h"
-#include "platform/linux/file_layer.h"
-#include "platform/linux/linux_platform.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
 #include "tools/input_file.h"
 #include "tools/json_value.h"
+#include "tools/output_file.h"
 #include "tools/value_text.h"
 
 namespace tavrel {
@@ -48,25 +44,7 @@ void convert(ToolContext& context, const Arguments& arguments) {
     return context.fail(
         format("cannot write %s: %s: %s", arguments.form, arguments.file, bytes.error().message));
   }
-  if (arguments.output == "-") {
-    context.out() << *bytes;
-    return;
-  }
-  // A device or pipe would be replaced by a file, which is never meant.
-  const auto status = FileLayer::status(arguments.output);
-  if (status && !S_ISREG(status->st_mode)) {
-    return context.fail(
-        format("cannot write %s: it is no regular file: use -o - and redirect", arguments.output));
-  }
-  const auto path = std::filesystem::absolute(arguments.output);
-  // Folders that are missing are a slip of the pen here, not something to make.
-  const auto folder = path.parent_path().string();
-  if (!FileLayer::status(folder)) {
-    return context.fail(format("cannot write %s: %s: %s", arguments.output, folder,
-                               std::string_view(std::strerror(errno))));
-  }
-  const auto written =
-      context.linuxPlatform().fileLayer().replace(path.string(), asBytes(*bytes), 0644);
+  const auto written = writeOutput(context, arguments.output, *bytes);
   if (!written) context.fail(written.error().message);
 }
 

@@ -6,8 +6,14 @@
 
 #include "base/format.h"
 #include "tools/log_commands.h"
+#include "tools/nand_commands.h"
+#include "tools/nandlog_commands.h"
 #include "tools/plist_commands.h"
 #include "tools/prefs_commands.h"
+#include "tools/records_commands.h"
+#include "tools/registry_commands.h"
+#include "tools/rehearse_command.h"
+#include "tools/report_commands.h"
 #include "tools/send_commands.h"
 #include "tools/stat_commands.h"
 #include "tools/status_command.h"
@@ -46,13 +52,19 @@ void run(const std::vector<std::string>& arguments, ToolContext& context) {
   CLI::App app("Looks into tavrel and the statistics that it reports.", "tavrelctl");
   addGlobalOptions(app, context);
   addStatusCommand(app, context);
+  addRehearseCommand(app, context);
   addLogCommands(app, context);
   addWhitelistCommands(app, context);
   addStatCommands(app, context);
   addSendCommands(app, context);
   addTaskingCommands(app, context);
+  addNandCommands(app, context);
+  addNandlogCommands(app, context);
+  addRecordsCommands(app, context);
   addPrefsCommands(app, context);
   addPlistCommands(app, context);
+  addRegistryCommands(app, context);
+  addReportCommands(app, context);
 
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));

@@ -1,5 +1,4 @@
 // tavrelctl as a whole: usage, preferences, property lists, logs, status.
-#include <gtest/gtest.h>
 
 #include "base/format.h"
 #include "device.h"
@@ -54,14 +53,12 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const std::string none = device.path("/none");
   for (const auto& arguments : {std::vector<std::string>{"status"}, {"stat", "set", "k", "1"}}) {
     EXPECT_EQ(device.runAt(none, arguments),
-              (Outcome{1, "",
-                       "tavrelctl: cannot use device root " + none +
-                           "/: No such file or directory: name the device's folder with --root or "
-                           "TAVREL_ROOT\n"}));
+              fails("cannot use device root " + none +
+                    "/: No such file or directory: name the device's folder with --root or "
+                    "TAVREL_ROOT"));
   }
-  EXPECT_EQ(
-      device.runAt("", {"status"}),
-      (Outcome{2, "", "tavrelctl: --root: names no folder: see 'tavrelctl status --help'\n"}));
+  EXPECT_EQ(device.runAt("", {"status"}),
+            fails("--root: names no folder: see 'tavrelctl status --help'", 2));
   EXPECT_FALSE(std::filesystem::exists(none));
   EXPECT_EQ(device.run({"--version"}), prints("tavrelctl 0.1.0\n"));
   for (const std::vector<std::string>& help :
@@ -75,10 +72,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
 TEST(Prefs, KeepTheKindThatWasAskedFor) {
   const TemporaryDevice device;
   const struct {
-    std::string kind;
-    std::string text;
-    std::string shown;
-    std::string json;
+    std::string kind, text;
+    std::string shown, json;
   } kCases[] = {
       {"--string", "a b", "a b\n", R"("a b")"},
       {"--bool", "yes", "true\n", "true"},
@@ -99,19 +94,18 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
         json);
   }
   EXPECT_EQ(device.run({"prefs", "set", "com.example.a", "flag", "true"}),
-            (Outcome{0, "", "tavrelctl: stored as a string: true: use --bool for a boolean\n"}));
+            fails("stored as a string: true: use --bool for a boolean", 0));
   EXPECT_EQ(device.run({"prefs", "set", "com.example.a", "n", "1x", "--int"}),
-            (Outcome{2, "",
-                     "tavrelctl: not an integer: 1x: give a decimal number of at most 64 bits\n"}));
+            fails("not an integer: 1x: give a decimal number of at most 64 bits", 2));
   EXPECT_EQ(device.run({"prefs", "list", "com.example.a"}),
             prints("KEY   TYPE        VALUE\n"
                    "flag  string      \"true\"\n"
                    "key   dictionary  {\"a\": <ff>, \"b\": [1]}\n"));
   EXPECT_EQ(device.run({"prefs", "list"}), prints("com.example.a\n"));
   EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), prints(""));
-  const Outcome absent{1, "",
-                       "tavrelctl: no preference key in domain com.example.a: 'tavrelctl prefs "
-                       "list com.example.a' shows what there is\n"};
+  const Outcome absent = fails(
+      "no preference key in domain com.example.a: 'tavrelctl prefs "
+      "list com.example.a' shows what there is");
   EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), absent);
   EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "key"}), absent);
 
@@ -149,23 +143,19 @@ TEST(Plist, ConvertsBetweenAllForms) {
             nlohmann::json::parse(json));
 
   EXPECT_EQ(device.run({"plist", "convert", "-", "-o", "/dev/null"}, json),
-            (Outcome{1, "",
-                     "tavrelctl: cannot write /dev/null: it is no regular file: use -o - and "
-                     "redirect\n"}));
+            fails("cannot write /dev/null: it is no regular file: use -o - and "
+                  "redirect"));
   EXPECT_EQ(device.run({"plist", "convert", "-", "-o", device.path("/no/x")}, json),
-            (Outcome{1, "",
-                     "tavrelctl: cannot write " + device.path("/no/x") + ": " + device.path("/no") +
-                         ": No such file or directory\n"}));
+            fails("cannot write " + device.path("/no/x") + ": " + device.path("/no") +
+                  ": No such file or directory"));
   EXPECT_FALSE(std::filesystem::exists(device.path("/no")));
   EXPECT_EQ(device.run({"plist", "show", "-"}, "hello"),
-            (Outcome{1, "",
-                     "tavrelctl: standard input: neither a property list nor JSON: it begins "
-                     "neither with \"bplist00\" nor with \"<\"\n"}));
+            fails("standard input: neither a property list nor JSON: it begins "
+                  "neither with \"bplist00\" nor with \"<\""));
   EXPECT_EQ(device.run({"plist", "show", "-"}, "[1,"),
-            (Outcome{1, "",
-                     "tavrelctl: standard input: parse error at line 1, column 4: syntax error "
-                     "while parsing value - unexpected end of input; expected '[', '{', or a "
-                     "literal\n"}));
+            fails("standard input: parse error at line 1, column 4: syntax error "
+                  "while parsing value - unexpected end of input; expected '[', '{', or a "
+                  "literal"));
 }
 
 // A whitelist, and a day's statistics of which one scalar may not leave.
@@ -217,9 +207,8 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   EXPECT_EQ(first["start"], "-5877641-06-23T00:00:00Z");
 
   EXPECT_EQ(device.run({"log", "preview", "--day", "19999"}),
-            (Outcome{1, "",
-                     "tavrelctl: no log would be submitted for day 19999 (2024-10-03): no "
-                     "whitelisted key has a value on that day\n"}));
+            fails("no log would be submitted for day 19999 (2024-10-03): no "
+                  "whitelisted key has a value on that day"));
   const Outcome verbose = device.run({"log", "preview", "--day", "20000", "-v"});
   EXPECT_EQ(verbose.out.size(), xml.out.size());
   EXPECT_NE(verbose.error.find("info: writing tallied log. yesterday=20000\n"), std::string::npos)
@@ -355,9 +344,7 @@ Activated applications (1)
       << shown;
   const std::string other = device.path(kPending) + "log-tallied-b.metadata.plist";
   EXPECT_EQ(device.run({"log", "show", other}),
-            (Outcome{1, "",
-                     "tavrelctl: not a tallied log: " + other +
-                         ": 'tavrelctl plist show FILE' shows it\n"}));
+            fails("not a tallied log: " + other + ": 'tavrelctl plist show FILE' shows it"));
   std::filesystem::remove(other);
   EXPECT_EQ(device.run({"log", "list"}).error, "tavrelctl: 1 log without metadata: cannot read " +
                                                    other + ": No such file or directory\n");

@@ -28,8 +28,7 @@ inline std::string xmlOf(std::string_view json) {
 
 struct Outcome {
   int status;
-  std::string out;
-  std::string error;
+  std::string out, error;
 
   bool operator==(const Outcome&) const = default;
   friend std::ostream& operator<<(std::ostream& stream, const Outcome& outcome) {
@@ -42,6 +41,11 @@ struct Outcome {
 /// `out` alone, with status 0.
 inline Outcome prints(std::string out) {
   return {0, std::move(out), {}};
+}
+
+/// `error` alone, as the tool says it, with status 1 unless told otherwise.
+inline Outcome fails(const std::string& error, int status = 1) {
+  return {status, {}, "tavrelctl: " + error + "\n"};
 }
 
 class TemporaryDevice {

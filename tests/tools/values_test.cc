@@ -48,8 +48,7 @@ TEST(JsonValue, EveryValueReadsBackEqual) {
 
 TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
   const struct {
-    std::string text;
-    std::string message;
+    std::string text, message;
   } kCases[] = {
       {R"({"a": {"b": null}})", "JSON/a/b: null has no place in a property list"},
       {"18446744073709551616", "JSON: the integer 18446744073709551616 does not fit 64 bits"},
@@ -116,9 +115,8 @@ TEST(Days, AreNumbersOrDates) {
     EXPECT_EQ(*parsed, day);
     EXPECT_EQ(dayText(day), shown);
   }
-  for (const std::string_view text : {"", "1x", "2147483648", "2026-02-30", "5881580-07-12"}) {
+  for (const std::string_view text : {"", "1x", "2147483648", "2026-02-30", "5881580-07-12"})
     ASSERT_FALSE(parseDay(text)) << text;
-  }
   EXPECT_EQ(parseDay("today").error().message,
             "not a day: today: give a 32-bit day number or YYYY-MM-DD");
   EXPECT_EQ(*parseDay("today", 20773), 20773);

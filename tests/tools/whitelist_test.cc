@@ -1,5 +1,4 @@
 // tavrelctl whitelist
-#include <gtest/gtest.h>
 
 #include "device.h"
 
@@ -76,7 +75,7 @@ TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   const TemporaryDevice device;
   const std::string path = device.path(kWhitelistFile);
   EXPECT_EQ(device.run({"whitelist", "check"}),
-            (Outcome{1, "", "tavrelctl: cannot read " + path + ": No such file or directory\n"}));
+            fails("cannot read " + path + ": No such file or directory"));
   device.write(kWhitelistFile, "<plist><dict>");
   const Outcome malformed = device.run({"whitelist", "check"});
   EXPECT_EQ(malformed.status, 1);

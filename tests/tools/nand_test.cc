@@ -1,0 +1,398 @@
+// tavrelctl nand: buffers in, figures out.
+#include <gtest/gtest.h>
+
+#include "base/format.h"
+#include "device.h"
+#include "tools/base64.h"
+
+namespace tavrel {
+namespace {
+
+using namespace std::string_literals;
+
+// Little-endian words of 32 bits.
+std::string words(std::initializer_list<std::uint32_t> list) {
+  std::string bytes;
+  for (const std::uint32_t word : list) {
+    for (unsigned i = 0; i < 4; ++i)
+      bytes += static_cast<char>(word >> (8 * i) & 0xFF);
+  }
+  return bytes;
+}
+
+std::string repeated(std::size_t count, const std::string& text) {
+  std::string all;
+  for (std::size_t i = 0; i < count; ++i)
+    all += text;
+  return all;
+}
+
+std::string built(const TemporaryDevice& device, const std::string& entries) {
+  const Outcome outcome =
+      device.run({"nand", "build", "-", "-o", "-"}, R"({"entries": )" + entries + "}");
+  EXPECT_EQ(outcome.status, 0) << outcome;
+  return outcome.out;
+}
+
+nlohmann::ordered_json jsonOf(const Outcome& outcome) {
+  const auto json = nlohmann::ordered_json::parse(outcome.out, nullptr, false);
+  EXPECT_EQ(json.value("format_version", 0), 1) << outcome;
+  return json;
+}
+
+// A device whose driver answers with `statistics`.
+void record(const TemporaryDevice& device, const std::string& statistics) {
+  const auto data = [](const std::string& bytes) {
+    return R"({"$data": ")" + base64Text(asBytes(bytes)) + "\"}";
+  };
+  device.write("/var/lib/tavrel/registry/storage.plist",
+               xmlOf(R"({"Services": [{"Class": "ASPStorage", "Methods": [
+                {"Method": 8, "Selector": 13, "Flags": 1, "Output": )" +
+                     data(words({static_cast<std::uint32_t>(statistics.size())})) + R"(},
+                {"Method": 8, "Selector": 13, "Flags": 0, "Output": )" +
+                     data(statistics) + "}]}]}"));
+}
+
+constexpr const char* kStatistics = R"([
+    ["exportVersion", 131075], ["numVirtualBlocks", 1024], ["pagesPerVirtualBlock", 2048],
+    ["bytesPerPage", 16384], ["hostWrites", 1000000], ["hostReads", 18446744073709551615],
+    ["bandErases", 250], ["numFreeVirtualBlocks", 93], ["utilFormatTime", 946684800],
+    ["readCountHisto", [8, 4, 2, 0, 0]], ["gcWrites", 7],
+    ["bandsMaxTempHisto0", 0], ["bandsMaxTempHisto1", 0], ["bandsMaxTempHisto2", 0]])";
+
+TEST(NandInfo, GroupsWhatTheDriverAnswers) {
+  const TemporaryDevice device;
+  record(device, built(device, kStatistics));
+  EXPECT_EQ(device.run({"nand", "info"}), prints(R"(Device
+  ExportVersion        131075  0x20003
+  DriverVersion            -1
+  DemoMode                  0
+  formatDaysSince2000       0  weeks
+  NumSleepOps               0
+
+Geometry
+  NumVirtualBlocks        1024  of 32.0 MiB, 32.0 GiB in all
+  BlocksPerVirtualBlock      0
+  PagesPerVirtualBlock    2048
+  BytesPerPage           16384
+  NumFreeVirtualBlocks      93  9.1 %
+  NodesTotal                 0
+  NodesFree                  0
+
+Wear
+  NumPhysicalErases               250
+  NumWearLevelOps                   0
+  HighEnduranceBlockEraseCount      0
+  NumMaintenanceRequests            0
+  MaintenanceRequestsFailedErase    0
+  MaintenanceRequestsFailedProg     0
+  MaintenanceRequestsFailedRead     0
+
+Traffic
+  NumLogicalReads         -1
+  NumLogicalWrites   1000000  sectors of 4 KiB: 3.8 GiB
+  NumPhysicalReads         0
+  NumPhysicalWrites        0
+  NumGCWrites              7
+
+Write amplification
+  2.05  erases x virtual block / logical writes
+
+BandsMaxTempHisto: 3 buckets, all 0
+
+ReadsBeforeErasure
+  0                 8  ########################################
+  50000             4  ####################
+  100000            2  ##########
+  150000 to 200000  0
+)"));
+
+  const auto json = jsonOf(device.run({"nand", "info", "--json"}));
+  EXPECT_EQ(json.size(), 33U) << json;
+  EXPECT_EQ(json["com.norvane.NANDInfo.NumLogicalReads"], -1);
+  EXPECT_EQ(json["com.norvane.NANDInfo.BandsMaxTempHisto2"], 0);
+
+  // An old buffer has the first figures only, and nothing to compute from.
+  record(device, built(device, R"([["exportVersion", 131073]])"));
+  const Outcome old = device.run({"nand", "info"});
+  EXPECT_EQ(old.status, 0) << old;
+  EXPECT_EQ(old.out.find("amplification"), std::string::npos) << old;
+  EXPECT_EQ(jsonOf(device.run({"nand", "info", "--json"})).size(), 16U);
+}
+
+TEST(NandInfo, AFailureIsNoZero) {
+  const TemporaryDevice device;
+  const std::string folder = device.path("/var/lib/tavrel/registry");
+  const auto failure = [&](const std::string& message) {
+    return "tavrelctl: no NAND information: " + message +
+           ": put a recording of the storage driver into " + folder + "\n";
+  };
+  EXPECT_EQ(device.run({"nand", "info"}),
+            (Outcome{1, "",
+                     "tavrelctl: Could not get matching Kernkit service for exporting classes\n" +
+                         failure("Unable to parse buffer")}));
+  record(device, built(device, R"([["hostWrites", 1]])"));
+  const Outcome outcome = device.run({"nand", "info", "--json"});
+  EXPECT_EQ(outcome.error, failure("Unsupported export version"));
+  EXPECT_EQ(outcome.status, 1);
+  EXPECT_EQ(jsonOf(outcome).dump(),
+            R"({"format_version":1,"com.norvane.NANDInfo.Error":"1",)"
+            R"("com.norvane.NANDInfo.ErrorMessage":"Unsupported export version"})");
+}
+
+TEST(NandParse, ReadsBackWhatWasBuilt) {
+  const TemporaryDevice device;
+  const std::string first = built(device, R"([["exportVersion", 4295098371], ["hostWrites", 1],
+      ["hostWrites", 18446744073709551615], ["readCountHisto", [1, 2, 3]], ["ECBins", [9]],
+      [21, [5, 5, 5]], ["TempSensorMax", []]])");
+  EXPECT_EQ(first, words({53,  1, 131075, 1, 4, 1, 1, 0, 4,   1, 0xFFFFFFFF, 0xFFFFFFFF,
+                          265, 3, 1,      0, 2, 0, 3, 0, 54,  1, 9,          0,
+                          21,  3, 5,      0, 5, 0, 5, 0, 184, 0}));
+  EXPECT_EQ(device.run({"nand", "parse", "-"}, first),
+            prints(R"(STATISTIC                       VALUE
+exportVersion              4295098371
+hostWrites                          1
+hostWrites       18446744073709551615
+readCountHisto0                     1
+readCountHisto1                     2
+readCountHisto2                     3
+ECBins                              9
+)"));
+  const Outcome parsed = device.run({"nand", "parse", "-", "--json"}, first);
+  EXPECT_EQ(jsonOf(parsed).dump(),
+            R"({"format_version":1,"result":1,"fields":{"exportVersion":131075,)"
+            R"("driverVersion":4294967295,"numVirtualBlocks":0,"blocksPerVirtualBlock":0,)"
+            R"("pagesPerVirtualBlock":0,"bytesPerPage":0,"hostReads":0,)"
+            R"("hostWrites":18446744073709551615,"numFreeVirtualBlocks":0,"wearLevMoves":0,)"
+            R"("nandReads":0,"nandWrites":0,"bandErases":0,"IND_pool_free":0,"IND_pool_count":0,)"
+            R"("utilFormatTime":0,"numSleepOps":0,"maxHighEnduranceBlockErases":0,)"
+            R"("readCountHisto":[1,2,3,0,0]},"entries":[["exportVersion",4295098371],)"
+            R"(["hostWrites",1],["hostWrites",18446744073709551615],["readCountHisto0",1],)"
+            R"(["readCountHisto1",2],["readCountHisto2",3],["ECBins",9]]})");
+
+  // What was parsed is itself a form to build from.
+  const Outcome again = device.run({"nand", "build", "-", "-o", "-"}, parsed.out);
+  EXPECT_EQ(device.run({"nand", "parse", "-", "--json"}, again.out), parsed);
+}
+
+TEST(NandParse, SaysWhereABufferIsBroken) {
+  const TemporaryDevice device;
+  const std::string good = R"(["hostWrites", 1], )";
+  const struct {
+    std::string entries;
+    std::string error;  // without what stands around every fault; empty for none
+    std::size_t recorded;
+  } kCases[] = {
+      {"[]", "it has 0 bytes, and a record has at least 8", 0},
+      {R"([{"hex": "01 02 03 04 05 06 07"}])", "it has 7 bytes, and a record has at least 8", 0},
+      {"[" + good + R"({"key": 805306369}])",
+       "the record at byte 16: 0x30000001 is above 0x30000000, the largest number of a statistic",
+       1},
+      {"[" + good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])",
+       "the record at byte 16: statistic 54 has 4294967295 values, but there is room for 1", 1},
+      {"[" + good + "[805306368, []]]", "", 1},
+  };
+  for (const auto& [entries, error, recorded] : kCases) {
+    const Outcome outcome = device.run({"nand", "parse", "-", "--json"}, built(device, entries));
+    EXPECT_EQ(outcome.error,
+              error.empty() ? ""
+                            : "tavrelctl: standard input is no whole statistics buffer: " + error +
+                                  ": fetch or build it anew\n");
+    EXPECT_EQ(outcome.status, error.empty() ? 0 : 1);
+    EXPECT_EQ(jsonOf(outcome)["result"], error.empty() ? 1 : 0);
+    EXPECT_EQ(jsonOf(outcome)["entries"].size(), recorded);
+  }
+  EXPECT_EQ(device.run({"nand", "parse", "-"}, words({4, 1, 1, 0, 0})),
+            (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
+                     "tavrelctl: standard input: the last 4 bytes are no whole unit of 8 and were "
+                     "passed over\n"}));
+}
+
+TEST(NandParse, DifferencesPairEqualNamesInTheirOrder) {
+  const TemporaryDevice device;
+  device.write("/a", built(device, R"([["hostWrites", 1], ["boots", 5], ["hostWrites", 2],
+      ["hostReads", 9], ["ECBins", [1, 2]], ["shutdowns", 0]])"));
+  device.write("/b", built(device, R"([["hostReads", 4], ["hostWrites", 1], ["numSleepOps", 3],
+      ["boots", 5], ["hostWrites", 7], ["ECBins", [1]], ["shutdowns", 18446744073709551615]])"));
+  const std::vector<std::string> command = {"nand", "parse", device.path("/a"), "--diff",
+                                            device.path("/b")};
+  EXPECT_EQ(device.run(command),
+            prints(R"(STATISTIC    BEFORE                 AFTER                 CHANGE
+hostWrites        2                     7                     +5
+hostReads         9                     4                     -5
+ECBins0           1                     -
+ECBins1           2                     -
+shutdowns         0  18446744073709551615  +18446744073709551615
+numSleepOps       -                     3
+ECBins            -                     1
+)"));
+  auto asJson = command;
+  asJson.push_back("--json");
+  const auto json = jsonOf(device.run(asJson));
+  EXPECT_EQ(json["results"].dump(), "[1,1]");
+  EXPECT_EQ(json["differences"].size(), 7U);
+  EXPECT_EQ(json["differences"][1].dump(),
+            R"({"statistic":"hostReads","before":9,"after":4,"change":-5})");
+  EXPECT_EQ(json["differences"][4].dump(),
+            R"({"statistic":"shutdowns","before":0,"after":18446744073709551615,"change":null})");
+  EXPECT_EQ(device.run({"nand", "parse", device.path("/a"), "--diff", device.path("/a")}),
+            prints(""));
+}
+
+TEST(NandBuild, NamesThePlaceOfAMistake) {
+  const TemporaryDevice device;
+  const struct {
+    std::string document;
+    std::string error;
+  } kCases[] = {
+      {"[]", "no list of entries: give an object with \"entries\": […]"},
+      {R"({"entries": [], "entrys": []})",
+       "\"entrys\" is no member of this form: records stand in \"entries\""},
+      {R"({"entries": [["boots", 1], ["bots", 1]]})",
+       "entries[1]: no statistic is named \"bots\": give the number of one that is not known"},
+      {R"({"entries": [["boots"]]})",
+       "entries[0]: 1 members: give a statistic and its value, or a list of its values"},
+      {R"({"entries": [["boots", -1]]})",
+       "entries[0]: -1 is no value: give an integer from 0 to 2^64 - 1"},
+      {R"({"entries": [["boots", [1.5]]]})",
+       "entries[0]: 1.5 is no value: give an integer from 0 to 2^64 - 1"},
+      {R"({"entries": [[4294967296, 1]]})",
+       "entries[0]: 4294967296 names no statistic: give its name, or its number of at most 32 "
+       "bits"},
+      {R"({"entries": [["ECBins0", 1], ["boots", 1], ["ECBins1", 1]]})",
+       "entries[2]: ECBins1 does not follow ECBins0: give the elements from 0 on, one after the "
+       "other, or a list"},
+      {R"({"entries": [{"key": 1, "sum": 2}]})",
+       "entries[0]: \"sum\" is no member of a record: it has key, count and values"},
+      {R"({"entries": [{"key": 1, "count": 4294967296}]})",
+       "entries[0]: \"count\": 4294967296 is no integer from 0 to 2^32 - 1"},
+      {R"({"entries": [{"key": 1, "values": 2}]})", "entries[0]: \"values\": 2 is no list"},
+      {R"({"entries": [{"hex": "012"}]})",
+       "entries[0]: \"hex\": \"012\": give pairs of hexadecimal digits"},
+      {R"({"entries": [7]})",
+       "entries[0]: 7 is no entry: give [statistic, value], {\"key\": …, \"values\": […]} or "
+       "{\"hex\": …}"},
+  };
+  for (const auto& [document, error] : kCases) {
+    EXPECT_EQ(device.run({"nand", "build", "-", "-o", device.path("/out")}, document),
+              (Outcome{1, "", "tavrelctl: standard input: " + error + "\n"}));
+  }
+  EXPECT_FALSE(std::filesystem::exists(device.path("/out")));
+}
+
+TEST(NandCounters, ParserIsThatOfChipAndMaker) {
+  const TemporaryDevice device;
+  std::string block;
+  for (std::uint32_t i = 0; i < 1024; ++i)
+    block += words({i});
+  const struct {
+    std::string chip, maker;
+    std::string parser;
+    std::uint32_t readStage0;
+    std::string error;
+  } kCases[] = {
+      {"K3V", "4582603A5700", "parseCountersAlgoGeneric", 0, ""},
+      {"K4V", "", "parseCountersAlgoGenericK4", 0, ""},
+      {"K2V", "4582603A5700", "parseCounters1xSandisk", 256, ""},
+      {"K2V", "ad825223215f", "parseCounters1xHynix", 256, ""},
+      {"", "4582", "parseCounters1y", 256, ""},
+      {"", "AGAD\x01", "parseCounters1y", 256,
+       "tavrelctl: unrecognized hex character: g\n"
+       "tavrelctl: unrecognized hex character: \\x01\n"},
+  };
+  for (const auto& [chip, maker, parser, readStage0, error] : kCases) {
+    const Outcome outcome = device.run(
+        {"nand", "counters", "-", "--chip-id", chip, "--manufacturer-id", maker, "--json"}, block);
+    EXPECT_EQ(outcome.status, 0) << outcome;
+    EXPECT_EQ(outcome.error, error);
+    const auto json = jsonOf(outcome);
+    EXPECT_EQ(json["parser"], parser);
+    ASSERT_EQ(json["counters"].size(), 11U);
+    EXPECT_EQ(json["counters"]["readStage"].size(), 33U);
+    EXPECT_EQ(json["counters"]["readStage"][0], readStage0);
+    EXPECT_EQ(json["counters"].back().size(), 12U);
+  }
+  const Outcome text =
+      device.run({"nand", "counters", "-", "--chip-id", "K4V", "--manufacturer-id", "0"}, block);
+  for (const char* part :
+       {"Parser  parseCountersAlgoGenericK4\n\nreadStage (33)\n   0:    0    1    2    3",
+        "\n  32:  110\n", "\nalgoNANDAccessesBin (8): all 0\n",
+        "\nreadStage10NumOfErrorsBin (10)\n  0  55  #################################",
+        "\nretentionIndication (12)\n  0:  0  0  75  76"}) {
+    EXPECT_NE(text.out.find(part), std::string::npos) << part << text;
+  }
+  EXPECT_EQ(device.run({"nand", "counters", "-", "--chip-id", "K4V", "--manufacturer-id", "0"},
+                       block + "x"),
+            (Outcome{1, "",
+                     "tavrelctl: standard input is no counter block: it has 4097 bytes, and a "
+                     "block has 4096: cut one out with dd bs=4096 count=1 skip=CHANNEL\n"}));
+}
+
+// A descriptor of version 6 with one field of kind 0.
+std::string descriptor(std::uint32_t count, const std::string& fieldFormat) {
+  std::string bytes =
+      words({0, 6, 4, count, 0, 0, 36, 0}) + std::string("%s\n\0", 4) + words({1, 0, 0, 0, 0});
+  bytes += fieldFormat;
+  bytes.resize(36 + 8 + 28);
+  return bytes;
+}
+
+TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
+  const TemporaryDevice device;
+  const Outcome fixed =
+      device.run({"nand", "snapshot", "-"}, repeated(3000, words({1}) + std::string(248, '\0')));
+  EXPECT_EQ(fixed.status, 0);
+  EXPECT_TRUE(fixed.out.starts_with("Key: \nT   - Timestamp\n"));
+  EXPECT_EQ(std::count(fixed.out.begin(), fixed.out.end(), '='), 26 * 3000);
+  EXPECT_TRUE(fixed.out.ends_with("\n\n"));
+
+  // A text far longer than its records.
+  device.write("/wide", descriptor(3, "%4096u|"));
+  const std::vector<std::string> command = {"nand", "snapshot", "-", "--descriptor",
+                                            device.path("/wide")};
+  const std::string wide = std::string(4095, ' ');
+  EXPECT_EQ(device.run(command, words({7, 0, 8})), prints("%s\n" + wide + "7|\n" + wide + "8|\n"));
+
+  EXPECT_EQ(device.run(command, words({7, 0})),
+            (Outcome{1, "",
+                     "tavrelctl: cannot render " + device.path("/wide") +
+                         ": 3 records of 4 bytes are more than the buffer's 8\n"}));
+  device.write("/wide", descriptor(1, "%n"));
+  EXPECT_EQ(device.run(command, words({7})),
+            (Outcome{1, "",
+                     "tavrelctl: cannot render " + device.path("/wide") +
+                         ": the format \"%n\" of field 0 asks for what kind 0 does not give\n"}));
+}
+
+TEST(NandFreezer, TakesAFileOrTheDevicesSnapshot) {
+  const TemporaryDevice device;
+  const std::string found =
+      words({0x13, 4, 1, 0, 0, 0x909, 12, 0, 0}) + "VM_swapout\0\0"s +
+      words({0x901, 32, 0, 0, 0, 0, 0, 0, 0, 0, 0xFFFFFFFF, 0xFFFFFFFF, 0x14, 0, 1, 0});
+  const Outcome shown = prints("Traffic\n  VMFreezer.NumPhysicalWrites  18446744073709551615\n");
+  EXPECT_EQ(device.run({"nand", "freezer", "-"}, found), shown);
+
+  const std::string path = "/var/lib/tavrel/registry/stack-snapshot.bin";
+  const Outcome none = device.run({"nand", "freezer", "--json"});
+  EXPECT_EQ(none.status, 1);
+  EXPECT_EQ(jsonOf(none).dump(),
+            R"({"format_version":1,"com.norvane.NANDInfo.VMFreezer.Error":"1",)"
+            R"("com.norvane.NANDInfo.VMFreezer.ErrorMessage":)"
+            R"("Unable parse snapshot for VMFreezer NAND writes."})");
+  EXPECT_EQ(none.error,
+            "tavrelctl: no freezer writes: Unable parse snapshot for VMFreezer NAND writes.: put a "
+            "stack snapshot that holds the thread VM_swapout at " +
+                device.path(path) + "\n");
+  device.write(path, found);
+  EXPECT_EQ(device.run({"nand", "freezer"}), shown);
+  EXPECT_EQ(jsonOf(device.run({"nand", "freezer", "--json"})).dump(),
+            R"({"format_version":1,)"
+            R"("com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites":18446744073709551615})");
+  EXPECT_EQ(device.run({"nand", "freezer", "-"}, found.substr(0, 40)),
+            (Outcome{1, "",
+                     "tavrelctl: standard input: Unable parse snapshot for VMFreezer NAND writes.: "
+                     "give a stack snapshot whose first container holds the thread VM_swapout\n"}));
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,211 @@
+// tavrelctl records and nandlog.
+#include <csignal>
+#include <functional>
+
+#include "base/format.h"
+#include "device.h"
+#include "tools/record_reader.h"
+
+namespace tavrel {
+namespace {
+
+const std::string kRecords = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
+
+std::string recordLine(const std::string& time, int type, const std::string& content) {
+  return format("{\"time\":\"2026-11-27T%s\",\"type\":%d,\"record\":%s}\n", time, type, content);
+}
+
+const std::string kEccLine =
+    recordLine("18:02:18.250Z", 172, R"({"id":4,"count":2,"reg0":18446744073709551615,"reg1":-1})");
+const std::string kTelemetryLine =
+    recordLine("18:02:17.000Z", 176, R"({"RD":1,"s[0]":7,"s[1]":8,"s[3]":9,"t[0]":0.5})");
+
+TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
+  const TemporaryDevice device;
+  EXPECT_EQ(device.run({"records", "list"}), prints(""));
+  EXPECT_EQ(device.run({"records", "show"}), prints(""));
+  EXPECT_EQ(device.run({"records", "show", "--json"}).out,
+            "{\n  \"format_version\": 1,\n  \"records\": []\n}\n");
+
+  const std::string hostile[] = {"{\"time\":1}", "\xff", std::string(5000, '['),
+                                 R"({"time":"x","type":172,"record":{"a":)"};
+  std::string ecc = kEccLine;
+  for (const std::string& line : hostile)
+    ecc += line + (line.ends_with(':') ? "" : "\n");
+  device.write(kRecords + "172-2026-11-27.jsonl", ecc);
+  device.write(kRecords + "176-2026-11-27.jsonl", kTelemetryLine + "\n");
+  device.write(kRecords + "176-2026-11-02.jsonl",
+               recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}"));
+  device.write(kRecords + "notes.txt", kEccLine);
+  device.write(kRecords + "4294967296-2026-11-27.jsonl", kEccLine);
+
+  EXPECT_EQ(device.run({"records", "list"}),
+            prints(format("TYPE  DAY                 RECORDS  BYTES\n"
+                          " 176  20759 (2026-11-02)        1     %zu\n"
+                          " 172  20784 (2026-11-27)        5   %zu\n"
+                          " 176  20784 (2026-11-27)        1    %zu\n",
+                          recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}").size(),
+                          ecc.size(), kTelemetryLine.size() + 1)));
+  const Outcome all = device.run({"records", "show"});
+  EXPECT_EQ(all.status, 0);
+  EXPECT_EQ(all.out,
+            "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
+            "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
+            "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n");
+  EXPECT_EQ(all.error,
+            "tavrelctl: 4 lines passed over, no record; the first is line 2 of " +
+                device.path(kRecords) +
+                "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n");
+  EXPECT_EQ(device.run({"records", "show", "--day", "2026-11-02"}).out,
+            all.out.substr(0, all.out.find('\n') + 1));
+  EXPECT_EQ(device.run({"records", "show", "--type", "176", "--day", "20784"}, "", 48).out,
+            "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3…\n");
+  EXPECT_EQ(device.run({"records", "show", "--type", "172", "--json"}).out,
+            "{\n  \"format_version\": 1,\n  \"records\": [\n    " +
+                kEccLine.substr(0, kEccLine.size() - 1) + "\n  ]\n}\n");
+  EXPECT_EQ(device.run({"records", "show", "--day", "soon"}).status, 2);
+
+  std::filesystem::remove(device.path(kRecords) + "172-2026-11-27.jsonl");
+  std::filesystem::create_directory(device.path(kRecords) + "172-2026-11-27.jsonl");
+  const Outcome partial = device.run({"records", "show", "--day", "20784"});
+  EXPECT_EQ(partial.out, "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n");
+  EXPECT_EQ(partial.status, 1);
+  EXPECT_EQ(std::count(partial.error.begin(), partial.error.end(), '\n'), 1) << partial;
+}
+
+TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
+  const TemporaryDevice device;
+  const std::string large(200'000, 'x');  // more than a block
+  RecordReader reader(device.path("/lines"));
+  std::vector<std::string> lines;
+  const auto read = [&](const std::string& content, bool takesRest) {
+    device.write("/lines", content);
+    lines.clear();
+    EXPECT_TRUE(reader.read(takesRest, [&](std::string_view line, std::uint64_t number) {
+      lines.push_back(std::to_string(number) + std::string(line));
+    }));
+    return lines;
+  };
+  EXPECT_EQ(read("a\n" + large, false), (std::vector<std::string>{"1a"}));
+  EXPECT_EQ(read("a\n" + large + "b\nc", false), (std::vector<std::string>{"2" + large + "b"}));
+  EXPECT_EQ(read("a\n" + large + "b\nc", true), (std::vector<std::string>{"3c"}));
+  EXPECT_EQ(read("new\n", false), (std::vector<std::string>{"1new"}));
+}
+
+// Calls a hook whenever what was printed is flushed.
+class HookedBuffer final : public std::stringbuf {
+ public:
+  std::function<void(const std::string& printed)> hook;
+
+ protected:
+  int sync() override {
+    if (hook) hook(str());
+    return 0;
+  }
+};
+
+TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
+  for (const bool json : {false, true}) {
+    const TemporaryDevice device;
+    HookedBuffer buffer;
+    const std::string part = kTelemetryLine.substr(0, 20);
+    const std::string first = json ? kEccLine : "count=2";
+    const std::string second = json ? kTelemetryLine : "s=[7,8]";
+    int stage = 0;
+    buffer.hook = [&](const std::string& printed) {
+      if (stage == 0) {  // without a folder so far
+        device.write(kRecords + "172-2026-11-27.jsonl", kEccLine + part);
+        stage = 1;
+      } else if (stage == 1 && printed.find(first) != std::string::npos) {
+        EXPECT_EQ(printed.find("RD"), std::string::npos);
+        std::ofstream(device.path(kRecords) + "172-2026-11-27.jsonl", std::ios::app)
+            << kTelemetryLine.substr(part.size());
+        stage = 2;
+      } else if (stage == 2 && printed.find(second) != std::string::npos) {
+        stage = 3;
+        raise(SIGTERM);
+      }
+    };
+    std::istringstream in;
+    std::ostream out(&buffer);
+    std::ostringstream error;
+    std::vector<std::string> arguments{"--root", device.path(""), "records", "show", "--follow"};
+    if (json) arguments.emplace_back("--json");
+    EXPECT_EQ(runTavrelctl(arguments, {.in = in, .out = out, .error = error}), 0);
+    EXPECT_EQ(error.str(), "");
+    EXPECT_EQ(stage, 3);
+    if (json) {
+      EXPECT_EQ(buffer.str(), kEccLine + kTelemetryLine);
+    }
+  }
+}
+
+TEST(Nandlog, ShowsTheNewestLogAndWhenTheNextMayBeWritten) {
+  const TemporaryDevice device;
+  const Outcome none = device.run({"nandlog", "show"});
+  EXPECT_EQ(none,
+            (Outcome{1, "Next log        the next run may write one; none was written so far\n",
+                     "tavrelctl: no NAND log waits or was sent on: one is written when the "
+                     "write amplification is high\n"}));
+
+  const std::string outbox = "/var/mobile/Library/Logs/Submission/outbox/";
+  const auto file = [&](const std::string& name, const char* type, const std::string& text) {
+    device.write(outbox + name + ".log", text);
+    device.write(outbox + name + ".metadata.plist",
+                 xmlOf(format(R"({"LogType": "%s", "LogName": "StorageStatus",
+                                  "Time": {"$date": "2026-11-1%s:00:00Z"}})",
+                              type, name)));
+  };
+  file("6T18", "165",
+       "System ID: 1-2\nOS Version: A: b\n\n2026-11-16 18:02:18 +0000 a b[211]: "
+       "UserWamp:2.05;com.norvane.NANDInfo.x:7;odd:key:1;ValidityList[0]:12,-1;IntermediateWamp:"
+       "inf\n");
+  file("6T17", "165", "older");
+  file("7T18", "193", "other");
+  device.run({"prefs", "set", "com.norvane.zentrix.tavrel", "SSLastLoggedAt",
+              "2026-01-01T00:00:00Z", "--date"});
+  EXPECT_EQ(device.run({"nandlog", "show"}), prints("Log             " + device.path(outbox) +
+                                                    R"(6T18.log (outbox)
+System ID       1-2
+OS Version      A: b
+Written by      a b[211]
+
+Write amplification (2)
+  UserWamp          2.05
+  IntermediateWamp   inf
+
+NAND information (1)
+  com.norvane.NANDInfo.x  7
+
+Valid pages by bucket (1)
+  ValidityList[0]  12,-1
+
+Others (1)
+  odd:key  1
+
+Next log        the next run may write one; the last was written 2026-01-01 00:00:00 +0000
+)"));
+  device.run({"prefs", "set", "com.norvane.zentrix.tavrel", "SSLastLoggedAt",
+              "2200-01-01T00:00:00Z", "--date"});
+  const Outcome json = device.run({"nandlog", "show", "--json"});
+  const auto document = nlohmann::json::parse(json.out, nullptr, false);
+  EXPECT_EQ(document["next"], nlohmann::json::parse(R"({
+      "last_logged": "2200-01-01T00:00:00Z", "last_is_in_future": true, "allowed_now": false,
+      "allowed_from": "2200-01-08T00:00:00Z"})"));
+  EXPECT_EQ(document["log"]["validity"], nlohmann::json::parse(R"({"ValidityList[0]": [12, -1]})"));
+  EXPECT_EQ(document["log"]["write_amplification"],
+            nlohmann::json::parse(R"({"UserWamp": 2.05, "IntermediateWamp": "inf"})"));
+  EXPECT_EQ(document["log"]["date"], "2026-11-16 18:02:18 +0000");
+
+  file("8T18", "165", "no log\n\nof the form");
+  EXPECT_EQ(device.run({"nandlog", "show"}),
+            (Outcome{1,
+                     "Next log        not before 2200-01-08 00:00:00 +0000: the last is dated "
+                     "2200-01-01 00:00:00 +0000, later than now; 'tavrelctl prefs delete "
+                     "com.norvane.zentrix.tavrel SSLastLoggedAt' lets the next run write one\n",
+                     "tavrelctl: not a NAND log: " + device.path(outbox) +
+                         "8T18.log: 'tavrelctl log show 8T18.log' shows it\n"}));
+}
+
+}  // namespace
+}  // namespace tavrel

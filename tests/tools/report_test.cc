@@ -1,0 +1,296 @@
+// The example recording, looked at with the registry and report commands.
+#include <gtest/gtest.h>
+
+#include "base/format.h"
+#include "device.h"
+#include "platform/plist/binary.h"
+#include "platform/plist/coding.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Array;
+using plist::Dictionary;
+using plist::Value;
+
+constexpr const char* kRecording = "/var/lib/tavrel/registry/report.plist";
+
+std::string example() {
+  std::ostringstream content;
+  content << std::ifstream(TAVREL_EXAMPLES "/registry/report.plist").rdbuf();
+  return content.str();
+}
+
+class ReportTest : public testing::Test {
+ protected:
+  ReportTest() { device.write(kRecording, example()); }
+
+  Dictionary recording() const { return plist::read(asBytes(example()))->dictionary(); }
+  void play(const Dictionary& recording) {
+    device.write(kRecording, *plist::writeBinary(recording));
+  }
+
+  TemporaryDevice device;
+};
+
+TEST_F(ReportTest, ListsChannelsAsTreeAndTable) {
+  EXPECT_EQ(device.run({"report", "list"}),
+            prints(R"(CHANNEL                  FORMAT     UNIT      CATEGORIES  ELEMENTS  ID
+flash0 <id 0x100000201>
+  NAND
+    Traffic
+      Host reads         simple     4KiB      0x0101             1  0x486f73745264
+      Host writes        simple     4KiB      0x0101             1  0x486f73745772
+    Latency
+      Read latency       histogram  us        0x0001             7  0x52644c6174
+    Errors
+      Corrected per die  array      events    0x0004             2  0x456363446965
+  Power
+    Power state          state      24Mticks  0x0002             3  0x5077725374
+  Temperature
+    Controller           simple     mC        0x0002             1  0x54656d7043746c
+radio0 <id 0x100000202>
+  Packets
+    Receive
+      DATARe             simple     packets   0x0001             1  0x444154415265
+      CTRLRe             simple     packets   0x0001             1  0x4354524c5265
+    Transmit
+      DATATr             simple     packets   0x0001             1  0x444154415472
+      CTRLTr             simple     packets   0x0001             1  0x4354524c5472
+  Resets
+    Since start          simple               0x0004             1  0x1
+)"));
+  EXPECT_EQ(device.run({"report", "list", "--flat", "--category", "4", "--group", "NAND"}),
+            prints("DRIVER                   GROUP  SUBGROUP  CHANNEL            FORMAT  UNIT    "
+                   "CATEGORIES  ELEMENTS  ID\n"
+                   "flash0 <id 0x100000201>  NAND   Errors    Corrected per die  array   events  "
+                   "0x0004             2  0x456363446965\n"));
+  const struct {
+    std::vector<std::string> selection;
+    std::string names;
+  } kCases[] = {
+      {{"--subgroup", "Receive"}, "DATARe CTRLRe "},
+      {{"--group", "NAND", "--subgroup", "Receive"}, ""},
+      {{"--category", "0x6", "--driver", "flash0"}, "Corrected per die Power state Controller "},
+      {{"--unit", "4KiB"}, "Host reads Host writes "},
+      {{"--unit", "0x0100007980000018"}, "Power state "},
+      {{"--driver", "4294967810", "--format", "1", "--category", "4"}, "Since start "},
+      {{"--driver", "radio0 <id 0x100000202>", "--format", "unknown"}, ""},
+      {{"--driver", "radio"}, ""},
+      {{"--format", "state"}, "Power state "},
+  };
+  for (const auto& [selection, names] : kCases) {
+    std::vector<std::string> arguments{"report", "list", "--json"};
+    arguments.insert(arguments.end(), selection.begin(), selection.end());
+    std::string found;
+    const auto json = nlohmann::json::parse(device.run(arguments).out);
+    for (const auto& channel : json["channels"])
+      found += channel["name"].get<std::string>() + ' ';
+    EXPECT_EQ(found, names) << selection[1];
+  }
+}
+
+TEST_F(ReportTest, SamplesAndSubtracts) {
+  EXPECT_EQ(device.run({"report", "sample", "--driver", "flash0"}),
+            prints(R"(flash0 <id 0x100000201>
+  NAND
+    Traffic
+      Host reads   81200000  4KiB
+      Host writes  40100000  4KiB
+    Latency
+      Read latency (us)
+        (0, 2]          0
+        (2, 4]          0
+        (4, 8]          0
+        (8, 16]        10  #                         mean 13.0, 9 to 15
+        (16, 32]      700  ########################  mean 24.3, 17 to 32
+        (32, 1000]     40  #                         mean 225.0, 60 to 900
+        (1000, 2000]    0
+    Errors
+      Corrected per die (events)
+        [0]  3  0  7  1
+        [4]  0  2  -  -
+  Power
+    Power state (24Mticks)
+      ACTV  12.0%  ##                120.000 s  entered 900
+      IDLE  70.0%  ################  700.000 s  entered 950  current
+      SLP   18.0%  ####              180.000 s   entered 50
+  Temperature
+    Controller  41250  mC
+)"));
+  EXPECT_EQ(device.run({"report", "sample", "--category", "2", "--delta", "--count", "2",
+                        "--interval", "0"}),
+            prints(R"(Change 1 of 2
+flash0 <id 0x100000201>
+  Power
+    Power state (24Mticks)
+      ACTV  20.0%  ####                 0.200 s  entered 4  current
+      IDLE  80.0%  ###################  0.800 s  entered 3
+      SLP    0.0%                       0.000 s  entered 0
+  Temperature
+    Controller  250  mC
+
+Change 2 of 2
+flash0 <id 0x100000201>
+  Power
+    Power state (24Mticks)
+      ACTV  30.0%  #######         0.300 s  entered 5
+      IDLE  10.0%  ##              0.100 s  entered 4
+      SLP   60.0%  ##############  0.600 s  entered 1  current
+  Temperature
+    Controller  -125  mC
+)"));
+  const auto json =
+      nlohmann::json::parse(device.run({"report", "sample", "--group", "NAND", "--json"}).out);
+  EXPECT_EQ(json["format_version"], 1);
+  EXPECT_EQ(json["missing"], 0);
+  const auto& channels = json["channels"];
+  EXPECT_EQ(channels[0], nlohmann::json::parse(R"({
+    "driver": "flash0 <id 0x100000201>", "driver_id": 4294967809, "group": "NAND",
+    "subgroup": "Traffic", "name": "Host reads", "id": 79643515572836, "format": "simple",
+    "categories": 257, "elements": 1, "unit": 648672277969240068, "unit_label": "4KiB",
+    "timestamp": 24000000000, "value": 81200000})"));
+  EXPECT_EQ(channels[2]["buckets"][5], nlohmann::json::parse(R"({"lower": 32, "upper": 1000,
+    "hits": 40, "minimum": 60, "maximum": 900, "sum": 9000})"));
+  EXPECT_TRUE(channels[2]["buckets"][0]["sum"].is_null());
+  EXPECT_EQ(channels[3]["values"], nlohmann::json::parse("[3, 0, 7, 1, 0, 2, null, null]"));
+}
+
+TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
+  // The counters of a state run backwards, over the end of 64 bits.
+  std::vector<std::byte> group(64);
+  Array groups = Array::create();
+  for (const std::uint64_t count : {std::uint64_t{5}, ~std::uint64_t{0}}) {
+    storeLittle64(group, 0, 7);
+    storeLittle64(group, 8, 8);
+    storeLittle64(group, 16, 0x100000002);
+    storeLittle64(group, 32, 1);
+    storeLittle64(group, 40, count);
+    storeLittle64(group, 48, count);
+    groups.append(plist::Data(group));
+  }
+  Array channels = Array::create();
+  channels.append(Array{8, 0x100000002});
+  const Dictionary legend{{"IOReportChannels", channels}};
+  play({{"Services",
+         Array{Dictionary{{"Class", "A\x1b"},
+                          {"EntryID", 7},
+                          {"Properties", Dictionary{{"IOReportLegendPublic", true},
+                                                    {"IOReportLegend", Array{legend}}}}}}},
+        {"Hub",
+         Dictionary{{"Channels", Array{Dictionary{
+                                     {"DriverID", 7}, {"ChannelID", 8}, {"Elements", groups}}}}}}});
+  EXPECT_EQ(device.run({"report", "sample", "--count", "2", "--interval", "0"}),
+            prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0%  "
+                   "########################  5  entered 5\n\n"
+                   "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0%  "
+                   "########################  18446744073709551615  entered "
+                   "18446744073709551615\n"));
+  const auto json = nlohmann::json::parse(
+      device.run({"report", "sample", "--delta", "--interval", "0", "--json"}).out);
+  EXPECT_EQ(json["channels"][0]["states"], nlohmann::json::parse(R"([{"id": 1, "name": null,
+    "in_transitions": -6, "residency": -6, "duty_cycle": 1.0, "current": false}])"));
+}
+
+TEST_F(ReportTest, DescribesInTheSystemsWords) {
+  EXPECT_EQ(device.run({"report", "describe", "--group", "Power"}),
+            prints("flash0 <id 0x100000201> Power state < 0x5077725374 (24Mticks) | G/g "
+                   "Power/(none) | cat 0x02 | format 0x02 | elts 3 >\n"
+                   "           Power state[    ACTV] = { # 900      1.200e+02 s / 12.0% }\n"
+                   "           Power state[    IDLE] = { # 950      7.000e+02 s / 70.0% }\n"
+                   "           Power state[     SLP] = { # 50       1.800e+02 s / 18.0% }\n"));
+  EXPECT_EQ(device.run({"report", "describe", "--channels", "--group", "Resets"}),
+            prints("radio0 <id 0x100000202> Since start < 0x1 ((null)) | G/g Resets/(none) | cat "
+                   "0x04 | format 0x01 | elts 1 >\n"));
+}
+
+TEST_F(ReportTest, SaysWhatIsMissing) {
+  const Dictionary noHub = recording();
+  Dictionary(noHub).remove("Hub");
+  const Dictionary refusing = recording();
+  refusing.dictionary("Hub").set("MethodErrors", Dictionary{{"2", 0xE00002C5}});
+  const Dictionary forgetful = recording();
+  forgetful.dictionary("Hub").array("Channels").remove(0);
+  const Dictionary badLegend = recording();
+  badLegend.array("Services").at(2).dictionary().dictionary("Properties").set("IOReportLegend", 1);
+  const std::string subscribe = "cannot subscribe to the channels";
+  const struct {
+    Dictionary recording;
+    std::vector<std::string> arguments;
+    int status;
+    std::string error;
+  } kCases[] = {
+      {noHub,
+       {"sample"},
+       1,
+       subscribe + " (0xe00002f0): there is no hub: a recording in /var/lib/tavrel/registry must "
+                   "have a \"Hub\""},
+      {refusing,
+       {"describe"},
+       1,
+       subscribe + ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
+                   "registry list' shows the drivers and the hub"},
+      {forgetful, {"sample"}, 0, "1 channel without values: the hub does not know them"},
+      {badLegend, {"list"}, 0, "radio0 <id 0x100000202>: bad legend"},
+      {noHub,
+       {"sample", "--group", "None"},
+       1,
+       "no such channel is published: 'tavrelctl report list' shows what there is"},
+      {noHub,
+       {"list", "--category", "0x10000"},
+       2,
+       "--category: not a number of at most 16 bits: 0x10000: see 'tavrelctl report list --help'"},
+      {noHub,
+       {"list", "--format", "sample"},
+       2,
+       "--format: not a format of report channels: sample: see 'tavrelctl report list --help'"},
+  };
+  for (const auto& [recording, arguments, status, error] : kCases) {
+    play(recording);
+    std::vector<std::string> all{"report"};
+    all.insert(all.end(), arguments.begin(), arguments.end());
+    const Outcome outcome = device.run(all);
+    EXPECT_EQ(outcome.status, status) << outcome;
+    EXPECT_EQ(outcome.error, "tavrelctl: " + error + '\n');
+    EXPECT_EQ(outcome.out.empty(), status != 0) << outcome;
+  }
+  std::filesystem::remove(device.path(kRecording));
+  EXPECT_EQ(device.run({"report", "list"}), prints(""));
+  EXPECT_EQ(device.run({"registry", "list"}), prints(""));
+}
+
+TEST_F(ReportTest, RegistryListsShowsAndRecords) {
+  EXPECT_EQ(device.run({"registry", "list"}),
+            prints("        ID  CLASS                   NAME         PUBLIC  CHANNELS  METHODS\n"
+                   "4294967296  ExampleRoot             root         no             0        0\n"
+                   "4294967809  ExampleFlashController  flash0       yes            6        0\n"
+                   "4294967810  ExampleRadio            radio0       yes            5        0\n"
+                   "4294967811  ExampleSensor           sensor0      no             1        0\n"
+                   "4294967300  IOReportHub             IOReportHub  no             0        0\n"));
+  EXPECT_EQ(device.run({"registry", "show", "0x100000000"}),
+            prints("Class = \"ExampleRoot\"\nEntryID = 4294967296\nName = \"root\"\nParents = {}\n"
+                   "Properties:\n  model = \"Example board\"\n"));
+  const auto json = nlohmann::json::parse(device.run({"registry", "list", "--json"}).out);
+  EXPECT_EQ(json["services"][1], nlohmann::json::parse(R"({"id": 4294967809,
+    "class": "ExampleFlashController", "name": "flash0", "public": true, "channels": 6,
+    "methods": 0})"));
+  EXPECT_EQ(device.run({"registry", "show", "9"}),
+            fails("no service has entry id 9: 'tavrelctl registry list' shows what there is"));
+  EXPECT_EQ(device.run({"registry", "show", "flash0"}),
+            fails("not an entry id: flash0: give a 64-bit number, decimal or with 0x", 2));
+
+  // What is recorded plays back the same, with what a second recording adds.
+  EXPECT_EQ(device.run({"registry", "record", "-"}), prints(example()));
+  device.write("/var/lib/tavrel/registry/z.plist",
+               xmlOf(R"({"Generation": 2, "Services": [{"Class": "Z"}, 5]})"));
+  const Outcome listed = device.run({"registry", "list"});
+  const std::string file = device.path("/all.plist");
+  EXPECT_EQ(device.run({"registry", "record", file}).status, 0);
+  std::filesystem::rename(file, device.path(kRecording));
+  std::filesystem::remove(device.path("/var/lib/tavrel/registry/z.plist"));
+  EXPECT_EQ(device.run({"registry", "list"}).out, listed.out);
+  EXPECT_NE(listed.out.find("         -  Z "), std::string::npos) << listed;
+}
+
+}  // namespace
+}  // namespace tavrel

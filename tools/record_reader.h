@@ -1,0 +1,47 @@
+// Reads a file of structured records as it grows.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+
+#include "base/expected.h"
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// Hands out whole lines, each once. A file that has become shorter is read from its beginning.
+class RecordReader {
+ public:
+  using LineHandler = std::function<void(std::string_view line, std::uint64_t number)>;
+
+  explicit RecordReader(std::string path) : path_(std::move(path)) {}
+
+  /// The lines that came since the last call. With `takesRest` also what stands behind the last
+  /// line end. A line of more than `limits::kStructuredRecordFileBytes` is an error.
+  Status read(bool takesRest, const LineHandler& handler);
+
+  const std::string& path() const { return path_; }
+
+ private:
+  std::string path_;
+  std::int64_t offset_ = 0;  // of what comes after `rest_`
+  std::uint64_t lines_ = 0;
+  std::string rest_;  // the beginning of a line
+};
+
+struct StructuredRecord {
+  std::string time;
+  plist::Value type;
+  plist::Dictionary content;
+};
+
+/// The record of one line. The error says why it is none.
+Expected<StructuredRecord> parseRecord(std::string_view line);
+
+/// A record on one line: "id=4 count=2 stages=[1,2,3]", the last for "stages[0]", "stages[1]" and
+/// so on.
+std::string recordText(const plist::Dictionary& record);
+
+}  // namespace tavrel

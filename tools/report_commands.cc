@@ -1,0 +1,190 @@
+#include "tools/report_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <chrono>
+#include <memory>
+#include <ostream>
+#include <thread>
+
+#include "base/format.h"
+#include "ioreport/ioreport.h"
+#include "tools/noting_platform.h"
+#include "tools/report_json.h"
+#include "tools/report_selection.h"
+#include "tools/report_view.h"
+#include "tools/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr double kLongestInterval = 86'400;  // seconds
+
+struct Arguments {
+  ReportSelection selection;
+  bool flat = false;
+  double interval = 1;
+  std::uint32_t count = 1;
+  bool delta = false;
+  bool channelsOnly = false;
+};
+
+// The selected channels and the connection that samples them.
+class Sampler {
+ public:
+  /// Says what is wrong when it cannot subscribe.
+  Sampler(ToolContext& context, const ReportSelection& selection)
+      : context_(context), noting_(context) {
+    const auto selected = selectChannels(noting_.platform(), selection);
+    if (!selected) {
+      context.fail(selected.error().message);
+      return;
+    }
+    if (IOReportGetChannelCount(*selected) == 0) {
+      context.fail("no such channel is published: 'tavrelctl report list' shows what there is");
+      return;
+    }
+    std::optional<ErrorObject> error;
+    subscription_ = IOReportCreateSubscription(noting_.platform().drivers, nullptr, *selected,
+                                               &subscribed_, 0, &error);
+    if (!subscription_) context.fail(reportFailure("subscribe to the channels", error));
+  }
+
+  explicit operator bool() const { return subscription_ != nullptr; }
+
+  /// An empty handle after having said why.
+  plist::Dictionary sample() {
+    std::optional<ErrorObject> error;
+    auto samples = IOReportCreateSamples(subscription_.get(), subscribed_, &error);
+    if (!samples) context_.fail(reportFailure("sample the channels", error));
+    return samples;
+  }
+
+  /// Subscribed channels that have no values.
+  std::int32_t missing(const plist::Dictionary& samples) const {
+    return IOReportGetChannelCount(subscribed_) - IOReportGetChannelCount(samples);
+  }
+
+ private:
+  ToolContext& context_;
+  NotingPlatform noting_;
+  plist::Dictionary subscribed_;
+  std::shared_ptr<IOReportSubscription> subscription_;
+};
+
+void list(ToolContext& context, const Arguments& arguments) {
+  NotingPlatform noting(context);
+  const auto channels = selectChannels(noting.platform(), arguments.selection);
+  if (!channels) return context.fail(channels.error().message);
+  if (context.json()) return context.printJson({{"channels", channelsJson(*channels)}});
+  printChannels(context.out(), *channels, arguments.flat, context.columns());
+}
+
+void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
+              std::uint32_t number, std::int32_t missing) {
+  if (context.json()) {
+    context.printJson({{"sample", number},
+                       {"delta", arguments.delta},
+                       {"missing", missing},
+                       {"channels", samplesJson(samples, arguments.delta)}});
+  } else {
+    if (number > 1) context.out() << '\n';
+    if (arguments.count > 1) {
+      const char* const what = arguments.delta ? "Change" : "Sample";
+      context.out() << format("%s %u of %u\n", what, number, arguments.count);
+    }
+    printSamples(context.out(), samples, arguments.delta, context.columns());
+  }
+  context.out().flush();
+}
+
+void sample(ToolContext& context, const Arguments& arguments) {
+  Sampler sampler(context, arguments.selection);
+  if (!sampler) return;
+  const std::chrono::duration<double> interval(arguments.interval);
+  plist::Dictionary previous;
+  std::int32_t reported = 0;
+  for (std::uint32_t number = arguments.delta ? 0 : 1; number <= arguments.count; ++number) {
+    if (number > (arguments.delta ? 0U : 1U)) std::this_thread::sleep_for(interval);
+    const plist::Dictionary samples = sampler.sample();
+    if (!samples) return;
+    const std::int32_t missing = sampler.missing(samples);
+    if (missing != reported) {
+      context.note(format("%s without values: the hub does not know them",
+                          counted(static_cast<std::uint64_t>(missing), "channel")));
+      reported = missing;
+    }
+    plist::Dictionary shown = samples;
+    if (previous) {
+      std::optional<ErrorObject> error;
+      shown = IOReportCreateSamplesDelta(previous, samples, &error);
+      if (!shown) return context.fail(reportFailure("subtract the samples", error));
+    }
+    if (number > 0) printOne(context, arguments, shown, number, missing);
+    if (arguments.delta) previous = samples;
+  }
+}
+
+// The system's own words. Some of them have no line end.
+void print(ToolContext& context, const std::optional<std::string>& description) {
+  if (!description) return;
+  context.out() << *description;
+  if (!description->ends_with('\n')) context.out() << '\n';
+}
+
+void describe(ToolContext& context, const Arguments& arguments) {
+  if (arguments.channelsOnly) {
+    NotingPlatform noting(context);
+    const auto channels = selectChannels(noting.platform(), arguments.selection);
+    if (!channels) return context.fail(channels.error().message);
+    for (const plist::Dictionary& channel : channelsIn(*channels))
+      print(context, IOReportChannelCopyDescription(channel, 0, nullptr));
+    return;
+  }
+  Sampler sampler(context, arguments.selection);
+  if (!sampler) return;
+  const plist::Dictionary samples = sampler.sample();
+  for (const plist::Dictionary& channel : channelsIn(samples)) {
+    print(context, IOReportChannelCopyDescription(channel, 0, nullptr));
+    const auto description = IOReportSampleCopyDescription(channel, 0, "  ");
+    print(context, description ? description : "  (no description)");
+  }
+}
+
+CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  CLI::App* const command = group.add_subcommand(name, description);
+  command->callback([&context, arguments, action] { action(context, *arguments); });
+  addSelectionOptions(*command, arguments->selection);
+  return *command;
+}
+
+}  // namespace
+
+void addReportCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* const group = app.add_subcommand("report", "Report channels that drivers publish");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  CLI::App& listed = addCommand(*group, "list", "List channels by driver, group and subgroup",
+                                arguments, context, list);
+  listed.add_flag("--flat", arguments->flat, "A table, one line a channel");
+  context.addJsonOption(listed);
+
+  CLI::App& sampled =
+      addCommand(*group, "sample", "Show the values of channels", arguments, context, sample);
+  sampled.add_option("--interval", arguments->interval, "Seconds between samples (default 1)")
+      ->type_name("S")
+      ->check(CLI::Range(0.0, kLongestInterval));
+  sampled.add_option("--count", arguments->count, "How many samples (default 1)")
+      ->type_name("N")
+      ->check(CLI::PositiveNumber);
+  sampled.add_flag("--delta", arguments->delta, "Show what changed since the sample before");
+  context.addJsonOption(sampled);
+
+  CLI::App& described = addCommand(*group, "describe", "Print the system's own descriptions",
+                                   arguments, context, describe);
+  described.add_flag("--channels", arguments->channelsOnly, "Of the channels only, not of values");
+}
+
+}  // namespace tavrel

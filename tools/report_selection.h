@@ -1,0 +1,46 @@
+// Which report channels a command is about.
+#pragma once
+
+#include <CLI/App.hpp>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/expected.h"
+#include "base/plist.h"
+#include "ioreport/ioreport.h"
+#include "platform/platform.h"
+
+namespace tavrel {
+
+/// Conditions from the command line, checked there; empty where there is none. All must hold.
+struct ReportSelection {
+  std::string group;
+  std::string subGroup;
+  std::string categories;  // a mask; a channel must have one of its categories
+  std::string format;
+  std::string unit;    // a label or a number
+  std::string driver;  // its name, with or without the id, or its id
+};
+
+void addSelectionOptions(CLI::App& command, ReportSelection& selection);
+
+/// The channels that drivers publish and the selection keeps, filed by driver and group. The error
+/// says why channels cannot be had.
+Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection);
+
+/// All channels of an aggregate, in its order.
+std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);
+
+/// "cannot WHAT: REASON (0xE00002F0): WHAT TO DO".
+std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error);
+
+/// "simple", "state", "histogram", "array" or "unknown".
+std::string_view formatName(std::uint8_t format);
+
+/// A number of at most 64 bits, decimal or with 0x.
+std::optional<std::uint64_t> parseWord(std::string_view text);
+
+}  // namespace tavrel
