@@ -1,0 +1,89 @@
+// Snapshot records through both renderers. Whatever the bytes say, a text is written whole, or cut
+// at the byte where its buffer ends, or its descriptor is refused and nothing is written.
+//
+// Input: capacity and size of the descriptor (16 bits each), the descriptor, the records.
+#include <cstdint>
+#include <cstdlib>
+#include <string>
+#include <vector>
+
+#include "storage/parse/snapshot_descriptor.h"
+#include "storage/parse/snapshot_text.h"
+
+namespace {
+
+using namespace tavrel;
+
+void expect(bool holds) {
+  if (!holds) std::abort();
+}
+
+// Enough for what inputs of a few kB ask for; more is cut, which is as good.
+constexpr std::size_t kRoom = 1U << 16;
+
+struct Rendered {
+  int answer;
+  std::size_t length;
+  std::vector<char> text;  // its size is the capacity, for the sanitizer
+};
+
+template <class Render>
+Rendered renderInto(std::size_t capacity, Render render) {
+  Rendered out{0, capacity, std::vector<char>(capacity, '#')};
+  out.answer = render(std::span(out.text), out.length);
+  if (out.answer != 1) expect(out.answer == 0 && out.length == capacity);
+  return out;
+}
+
+std::string_view textOf(const Rendered& out, std::size_t length) {
+  return {out.text.data(), length};
+}
+
+template <class Render>
+void checkCapacities(std::size_t capacity, Render render) {
+  const Rendered whole = renderInto(kRoom, render);
+  const bool isWhole = whole.answer == 1;
+  expect(!isWhole || (whole.length < kRoom && whole.text[whole.length] == '\0'));
+  const std::size_t length = isWhole ? whole.length : kRoom - 1;
+  if (isWhole) {
+    const Rendered exact = renderInto(length + 1, render);
+    expect(exact.answer == 1 && textOf(exact, length + 1) == textOf(whole, length + 1));
+    capacity %= length + 1;
+  }
+  if (capacity > length) return;
+  const Rendered cut = renderInto(capacity, render);
+  expect(cut.answer == 0);
+  if (capacity == 0) return;
+  expect(cut.text[capacity - 1] == '\0');
+  expect(textOf(cut, capacity - 1) == textOf(whole, capacity - 1));
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  const ByteSpan input = std::as_bytes(std::span(data, size));
+  const auto capacity = loadLittle16(input, 0);
+  const auto descriptorBytes = loadLittle16(input, 2);
+  const auto part = descriptorBytes ? slice(input, 4, *descriptorBytes) : std::nullopt;
+  if (!part) return 0;
+  // Buffers of their own, so that no read beyond their ends goes unseen.
+  const std::vector<std::byte> descriptor(part->begin(), part->end());
+  const ByteSpan behind = input.subspan(4 + part->size());
+  const std::vector<std::byte> records(behind.begin(), behind.end());
+
+  checkCapacities(*capacity, [&](std::span<char> text, std::size_t& length) {
+    return ASPParseSnapshotBuffer(records, text, length);
+  });
+  const auto inPlace = [&](std::span<char> text, std::size_t& length) {
+    return ASPParseSnapshotBufferWithInplaceParser(records, text, length, descriptor);
+  };
+  const auto layout = readSnapshotDescriptor(descriptor, records.size());
+  if (layout) {
+    checkCapacities(*capacity, inPlace);
+  } else {
+    expect(!layout.error().message.empty());
+    const Rendered refused = renderInto(16, inPlace);
+    expect(refused.answer == 0 && textOf(refused, 16) == std::string(16, '#'));
+  }
+  return 0;
+}
