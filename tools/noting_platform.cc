@@ -12,7 +12,10 @@ class NotingLog final : public SystemLog {
   explicit NotingLog(ToolContext& context) : context_(context) {}
   void write(LogLevel level, std::string_view message) override {
     if (level >= LogLevel::Default) context_.note(message);
+    hasErrors |= level == LogLevel::Error;
   }
+
+  bool hasErrors = false;
 
  private:
   ToolContext& context_;
@@ -76,6 +79,10 @@ Platform& NotingPlatform::platform() {
 
 RecordedRegistry& NotingPlatform::registry() {
   return services_->registry;
+}
+
+bool NotingPlatform::hasErrors() const {
+  return services_->log.hasErrors;
 }
 
 }  // namespace tavrel

@@ -39,6 +39,8 @@ class NotingPlatform {
   Platform& platform();
   /// The platform's registry of drivers.
   RecordedRegistry& registry();
+  /// Whether the system has said that something is wrong.
+  bool hasErrors() const;
 
  private:
   struct Services;

@@ -8,6 +8,7 @@
 
 #include "base/format.h"
 #include "ioreport/keys.h"
+#include "platform/linux/device_root.h"
 #include "platform/linux/recorded_fields.h"
 #include "platform/linux/recorded_registry.h"
 #include "platform/linux/recording.h"
@@ -27,9 +28,17 @@ struct Arguments {
   std::string file;
 };
 
-plist::Dictionary currentRecording(ToolContext& context) {
+// What could be read. When that is not all, notes have said why, and the exit status is 1.
+struct CurrentRecording {
+  plist::Dictionary content;
+  bool isWhole;
+};
+
+CurrentRecording currentRecording(ToolContext& context) {
   NotingPlatform noting(context);
-  return noting.registry().recording();
+  const plist::Dictionary content = noting.registry().recording();
+  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
+  return {content, !noting.hasErrors()};
 }
 
 // The services of a recording, the hub last.
@@ -61,7 +70,7 @@ void list(ToolContext& context, const Arguments&) {
                {"CHANNELS", Table::Align::Right},
                {"METHODS", Table::Align::Right}});
   Json services = Json::array();
-  for (const plist::Dictionary& service : servicesOf(currentRecording(context))) {
+  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
     const auto id = wordOf(service.get("EntryID"));
     const std::string_view className = *service.string("Class");
     const std::string_view name = service.string("Name").value_or(className);
@@ -82,7 +91,10 @@ void list(ToolContext& context, const Arguments&) {
     }
   }
   if (context.json()) return context.printJson({{"services", std::move(services)}});
-  if (!table.empty()) table.print(context.out(), context.columns());
+  if (table.empty())
+    return context.note("no drivers: recordings of them belong in " +
+                        context.root().path("/var/lib/tavrel/registry"));
+  table.print(context.out(), context.columns());
 }
 
 void show(ToolContext& context, const Arguments& arguments) {
@@ -91,7 +103,7 @@ void show(ToolContext& context, const Arguments& arguments) {
     return context.failUsage(
         format("not an entry id: %s: give a 64-bit number, decimal or with 0x", arguments.id));
   }
-  for (const plist::Dictionary& service : servicesOf(currentRecording(context))) {
+  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
     if (wordOf(service.get("EntryID")) != *id) continue;
     if (context.json()) return context.printJson({{"service", jsonOf(service)}});
     return printOutline(context.out(), service);
@@ -101,7 +113,11 @@ void show(ToolContext& context, const Arguments& arguments) {
 }
 
 void record(ToolContext& context, const Arguments& arguments) {
-  const plist::Dictionary recording = currentRecording(context);
+  const auto [recording, isWhole] = currentRecording(context);
+  if (!isWhole) {
+    return context.fail(
+        format("nothing is written to %s: mend or remove what could not be read", arguments.file));
+  }
   const auto document = plist::writeXml(recording);
   if (!document) {
     return context.fail(

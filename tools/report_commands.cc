@@ -1,6 +1,7 @@
 #include "tools/report_commands.h"
 
 #include <CLI/CLI.hpp>
+#include <charconv>
 #include <chrono>
 #include <memory>
 #include <ostream>
@@ -75,17 +76,24 @@ void list(ToolContext& context, const Arguments& arguments) {
   NotingPlatform noting(context);
   const auto channels = selectChannels(noting.platform(), arguments.selection);
   if (!channels) return context.fail(channels.error().message);
+  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
   if (context.json()) return context.printJson({{"channels", channelsJson(*channels)}});
+  if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
   printChannels(context.out(), *channels, arguments.flat, context.columns());
 }
 
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
               std::uint32_t number, std::int32_t missing) {
   if (context.json()) {
-    context.printJson({{"sample", number},
-                       {"delta", arguments.delta},
-                       {"missing", missing},
-                       {"channels", samplesJson(samples, arguments.delta)}});
+    Json document = {{"sample", number},
+                     {"delta", arguments.delta},
+                     {"missing", missing},
+                     {"channels", samplesJson(samples, arguments.delta)}};
+    if (arguments.count == 1) return context.printJson(std::move(document));
+    // Of several each is one line, so that readers can tell where one ends.
+    Json line = {{"format_version", kJsonFormatVersion}};
+    line.update(document);
+    context.out() << line.dump(-1, ' ', false, Json::error_handler_t::replace) << '\n';
   } else {
     if (number > 1) context.out() << '\n';
     if (arguments.count > 1) {
@@ -150,6 +158,24 @@ void describe(ToolContext& context, const Arguments& arguments) {
   }
 }
 
+// What is wrong with the text of an option; nothing when it is good.
+
+std::string secondsFault(const std::string& text) {
+  double seconds = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), seconds);
+  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
+  if (isNumber && seconds >= 0 && seconds <= kLongestInterval) return {};
+  return format("not a number of seconds: %s: give 0 to 86400, such as 0.5", text);
+}
+
+std::string countFault(const std::string& text) {
+  std::uint32_t count = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), count);
+  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
+  if (isNumber && count > 0) return {};
+  return format("not a number of samples: %s: give 1 or more", text);
+}
+
 CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
                      const std::shared_ptr<Arguments>& arguments, ToolContext& context,
                      void (*action)(ToolContext&, const Arguments&)) {
@@ -175,10 +201,10 @@ void addReportCommands(CLI::App& app, ToolContext& context) {
       addCommand(*group, "sample", "Show the values of channels", arguments, context, sample);
   sampled.add_option("--interval", arguments->interval, "Seconds between samples (default 1)")
       ->type_name("S")
-      ->check(CLI::Range(0.0, kLongestInterval));
+      ->check(secondsFault);
   sampled.add_option("--count", arguments->count, "How many samples (default 1)")
       ->type_name("N")
-      ->check(CLI::PositiveNumber);
+      ->check(countFault);
   sampled.add_flag("--delta", arguments->delta, "Show what changed since the sample before");
   context.addJsonOption(sampled);
 

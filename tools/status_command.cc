@@ -18,7 +18,7 @@ namespace tavrel {
 namespace {
 
 struct DeviceStatus {
-  bool submissionAllowed = false;
+  std::optional<bool> submissionAllowed;  // nothing when preferences cannot be read
   std::int32_t today = 0;
   std::optional<std::int32_t> lastDay;   // of the gated run
   std::optional<std::string> osVersion;  // of the last log
@@ -39,7 +39,9 @@ DeviceStatus takeStatus(ToolContext& context) {
   LinuxPlatform& device = context.linuxPlatform();
   Platform& platform = device.platform();
   DeviceStatus status;
-  status.submissionAllowed = platform.submission.isDiagnosticSubmissionEnabled();
+  const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
+      "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
+  if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
   status.today = platform.statistics.BHDaysSince1970();
   bool hasRun = false;
   const auto lastDay =
@@ -79,7 +81,8 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
     }
   }
   context.printJson(
-      {{"submission_allowed", status.submissionAllowed},
+      {{"submission_allowed",
+        status.submissionAllowed ? Json(*status.submissionAllowed) : Json(nullptr)},
        {"today", jsonOfDay(status.today)},
        {"last_reported_day", jsonOfDay(status.lastDay)},
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
@@ -100,7 +103,8 @@ std::string storeText(const DeviceStatus& status) {
 
 void printText(ToolContext& context, const DeviceStatus& status) {
   Table table({{""}, {""}});
-  table.add({"Submission", status.submissionAllowed
+  table.add({"Submission", !status.submissionAllowed ? "unknown"
+                           : *status.submissionAllowed
                                ? "allowed"
                                : "not allowed (allow it with: tavrelctl prefs set "
                                  "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)"});

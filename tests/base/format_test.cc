@@ -105,12 +105,7 @@ TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
   const std::string tooWide = size + "more than 4096";
   const std::string integer = "it takes a 32-bit integer, ";
   const std::string longText(38, 'a');
-  struct Case {
-    std::string format;
-    std::vector<FormatArgument> arguments;
-    std::string place, reason;
-  };
-  const Case cases[] = {
+  const std::tuple<std::string, std::vector<FormatArgument>, std::string, std::string> cases[] = {
       {"n=%n", {1}, R"("%n" at byte 2)", unknown},
       {"%d %", {1}, R"("%" at byte 3)", open},
       {"%-08.3l", {1}, R"("%-08.3l" at byte 0)", open},
@@ -125,14 +120,13 @@ TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
       {"%f", {1}, R"("%f" at byte 0)", "it takes a double, " + number},
       {"%ls", {"x"}, R"("%ls" at byte 0)", "'s' takes no length"},
       {"%*d", {1}, R"("%*d" at byte 0)", none},
-      {"%{" + longText + longText + "}s", {}, "\"%{" + longText + "\" at byte 0", none},
-  };
-  for (const Case& wrong : cases) {
+      {"%{" + longText + longText + "}s", {}, "\"%{" + longText + "\" at byte 0", none}};
+  for (const auto& [text, arguments, place, reason] : cases) {
     std::string out = "before ";
-    const Status status = appendForeignFormat(out, wrong.format, wrong.arguments);
-    EXPECT_EQ(out, "before ") << wrong.format;
-    ASSERT_FALSE(status) << wrong.format;
-    EXPECT_EQ(status.error().message, wrong.place + " of the format: " + wrong.reason);
+    const Status status = appendForeignFormat(out, text, arguments);
+    EXPECT_EQ(out, "before ") << text;
+    ASSERT_FALSE(status) << text;
+    EXPECT_EQ(status.error().message, place + " of the format: " + reason);
   }
   EXPECT_EQ(printed("%u%%", {1, 2, 3}), "error: the format uses 1 of its 3 arguments");
 }

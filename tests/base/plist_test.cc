@@ -22,29 +22,18 @@ std::vector<std::string> keysOf(const Dictionary& dictionary) {
 }
 
 TEST(Number, ComparesByValueWhateverTheKind) {
-  struct Case {
-    Number a;
-    Number b;
-    bool equal;
-  };
-  const Case cases[] = {
-      {std::int8_t{-1}, -1L, true},
-      {1, 1.0F, true},
-      {0, -0.0, true},
-      {NAN, std::numeric_limits<float>::quiet_NaN(), true},
-      {(1L << 53) + 1, kTwoTo53, false},
-      {1L << 53, kTwoTo53, true},
-      {1UL << 63, kTwoTo63, true},
-      {~0UL, 2 * kTwoTo63, false},
-      {std::numeric_limits<std::int64_t>::min(), -kTwoTo63, true},
-      {std::numeric_limits<std::int64_t>::min(), 1UL << 63, false},
-      {std::numeric_limits<std::int64_t>::max(), kTwoTo63, false},
-      {~0UL, -1.0, false},
-      {std::numeric_limits<std::int64_t>::max(), INFINITY, false},
-  };
-  for (const Case& c : cases) {
-    EXPECT_EQ(c.a == c.b, c.equal) << c.a.real() << " " << c.b.real();
-    EXPECT_EQ(c.b == c.a, c.equal) << c.a.real() << " " << c.b.real();
+  using Case = std::tuple<Number, Number, bool>;
+  for (const auto& [a, b, equal] :
+       {Case(std::int8_t{-1}, -1L, true), Case(1, 1.0F, true), Case(0, -0.0, true),
+        Case(NAN, std::numeric_limits<float>::quiet_NaN(), true),
+        Case((1L << 53) + 1, kTwoTo53, false), Case(1L << 53, kTwoTo53, true),
+        Case(1UL << 63, kTwoTo63, true), Case(~0UL, 2 * kTwoTo63, false),
+        Case(std::numeric_limits<std::int64_t>::min(), -kTwoTo63, true),
+        Case(std::numeric_limits<std::int64_t>::min(), 1UL << 63, false),
+        Case(std::numeric_limits<std::int64_t>::max(), kTwoTo63, false), Case(~0UL, -1.0, false),
+        Case(std::numeric_limits<std::int64_t>::max(), INFINITY, false)}) {
+    EXPECT_EQ(a == b, equal) << a.real() << " " << b.real();
+    EXPECT_EQ(b == a, equal) << a.real() << " " << b.real();
   }
 }
 

@@ -16,24 +16,14 @@ namespace tavrel {
 namespace {
 
 TEST(Text, WritesNumbersSoThatTheyReadBack) {
-  struct Case {
-    plist::Number number;
-    const char* text;
-  };
-  const Case cases[] = {
-      {0.1, "0.1"},
-      {1e22, "1e+22"},
-      {1e-5, "1e-05"},
-      {-0.0, "-0"},
-      {DBL_MAX, "1.7976931348623157e+308"},
-      {4.9e-324, "5e-324"},
-      {-INFINITY, "-inf"},
-      {std::copysign(NAN, -1.0), "nan"},
-      {std::numeric_limits<std::int64_t>::min(), "-9223372036854775808"},
-      {~0UL, "18446744073709551615"},
-  };
-  for (const Case& c : cases)
-    EXPECT_EQ(numberText(c.number), c.text);
+  using Case = std::pair<plist::Number, const char*>;
+  for (const auto& [number, text] :
+       {Case(0.1, "0.1"), Case(1e22, "1e+22"), Case(1e-5, "1e-05"), Case(-0.0, "-0"),
+        Case(DBL_MAX, "1.7976931348623157e+308"), Case(4.9e-324, "5e-324"), Case(-INFINITY, "-inf"),
+        Case(std::copysign(NAN, -1.0), "nan"),
+        Case(std::numeric_limits<std::int64_t>::min(), "-9223372036854775808"),
+        Case(~0UL, "18446744073709551615")})
+    EXPECT_EQ(numberText(number), text);
   std::mt19937_64 random(3);
   for (int i = 0; i < 10000; ++i) {
     const double value = std::bit_cast<double>(random());
@@ -63,23 +53,17 @@ TEST(Text, WritesObjectsAsPeopleReadThem) {
 }
 
 TEST(CivilTime, EveryDayOf32BitsHasADate) {
-  struct Case {
-    std::int64_t day;
-    CivilDate date;
-    const char* text;
-  };
-  const Case cases[] = {
+  const std::tuple<std::int64_t, CivilDate, const char*> cases[] = {
       {11016, {2000, 2, 29}, "2000-02-29"},
       {-719529, {-1, 12, 31}, "-0001-12-31"},
       {2932897, {10000, 1, 1}, "10000-01-01"},
       {INT32_MAX, {5881580, 7, 11}, "5881580-07-11"},
-      {INT32_MIN, {-5877641, 6, 23}, "-5877641-06-23"},
-  };
-  for (const Case& c : cases) {
-    EXPECT_EQ(civilFromDays(c.day), c.date) << c.text;
-    EXPECT_EQ(daysFromCivil(c.date), c.day) << c.text;
-    EXPECT_EQ(dateText(c.date), c.text);
-    EXPECT_EQ(parseDate(c.text), c.date);
+      {INT32_MIN, {-5877641, 6, 23}, "-5877641-06-23"}};
+  for (const auto& [day, date, text] : cases) {
+    EXPECT_EQ(civilFromDays(day), date) << text;
+    EXPECT_EQ(daysFromCivil(date), day) << text;
+    EXPECT_EQ(dateText(date), text);
+    EXPECT_EQ(parseDate(text), date);
   }
   CivilDate before = civilFromDays(INT32_MIN - std::int64_t{1});
   for (std::int64_t day = INT32_MIN; day <= INT32_MAX; day += day % 97 == 0 ? 1 : 49999) {
@@ -110,19 +94,14 @@ TEST(CivilTime, ReadsOnlyWhatItWrites) {
 }
 
 TEST(Utf8, TellsWellFormedFromMalformed) {
-  struct Case {
-    std::string_view text, repaired;
-  };
-  const Case malformed[] = {
-      {"\xC0\xAF", "\uFFFD\uFFFD"},                      // over-long
-      {"\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"},            // over-long
-      {"\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"},            // surrogate
-      {"\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD"},  // beyond U+10FFFF
-      {"\xE2\x82", "\uFFFD\uFFFD"},                      // cut
-  };
-  for (const Case& c : malformed) {
-    EXPECT_FALSE(isValidUtf8(c.text)) << c.repaired;
-    EXPECT_EQ(repairedUtf8(c.text), c.repaired);
+  // Over-long twice, a surrogate, beyond U+10FFFF, cut.
+  using Case = std::pair<std::string_view, std::string_view>;
+  for (const auto& [text, repaired] :
+       {Case("\xC0\xAF", "\uFFFD\uFFFD"), Case("\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"),
+        Case("\xED\xA0\x80", "\uFFFD\uFFFD\uFFFD"), Case("\xE2\x82", "\uFFFD\uFFFD"),
+        Case("\xF4\x90\x80\x80", "\uFFFD\uFFFD\uFFFD\uFFFD")}) {
+    EXPECT_FALSE(isValidUtf8(text)) << repaired;
+    EXPECT_EQ(repairedUtf8(text), repaired);
   }
   for (char32_t codePoint = 0; codePoint <= 0x110000; ++codePoint) {
     const bool exists = codePoint <= 0x10FFFF && (codePoint < 0xD800 || codePoint > 0xDFFF);

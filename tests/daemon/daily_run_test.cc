@@ -69,27 +69,20 @@ TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
                             "set com.norvane.tallied.tavrel LastOSUpdate", "roll support log"}));
 }
 
+// An absent day reads as 0, later than the day before 1970, and 2^40 as its low half, 0; the
+// yesterday of the first day is the last one.
 TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
-  const struct {
-    plist::Value stored;
-    std::int32_t today;
-    bool runs;
-  } kCases[] = {
-      {{}, 0, false},  // an absent day reads as 0, later than the day before 1970
-      {{}, 2, true},
-      {-5, 0, true},
-      {20001, 20000, false},
-      {"19999", 20000, true},
-      {std::int64_t{1} << 40, 20000, true},  // the low half is 0
-      {std::numeric_limits<std::int32_t>::max(), 20000, false},
-      {20000, std::numeric_limits<std::int32_t>::min(), true},  // its yesterday is the last day
-  };
-  for (const auto& c : kCases) {
-    fake.preferences.domain(kTavrelDomain).set(kDayKey, c.stored);
-    fake.store.today = c.today;
+  using Case = std::tuple<plist::Value, std::int32_t, bool>;
+  for (const auto& [stored, today, runs] :
+       {Case({}, 0, false), Case({}, 2, true), Case(-5, 0, true), Case(20001, 20000, false),
+        Case("19999", 20000, true), Case(std::int64_t{1} << 40, 20000, true),
+        Case(std::numeric_limits<std::int32_t>::max(), 20000, false),
+        Case(20000, std::numeric_limits<std::int32_t>::min(), true)}) {
+    fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);
+    fake.store.today = today;
     fake.journal.clear();
     runDailyIfNeeded(fake.platform, {});
-    EXPECT_EQ(!fake.journal.empty(), c.runs) << textOf(c.stored) << " on " << c.today;
+    EXPECT_EQ(!fake.journal.empty(), runs) << textOf(stored) << " on " << today;
   }
 }
 

@@ -117,31 +117,24 @@ TEST_F(TaskingTest, SynchronisesEachDomainOnce) {
 }
 
 TEST_F(TaskingTest, SubmitsAtOnceForSomeDaysAfterAnUpdate) {
-  const struct {
-    plist::Value days;  // "AggressiveSubmissionDays"
-    plist::Value updateDay;
-    std::int32_t today;
-    const char* message;
-  } kCases[] = {
-      {3, 100, 100, "Aggressive submission day 0 of 3; triggering log submission"},
-      {3, 100, 102, "Aggressive submission day 2 of 3; triggering log submission"},
-      {3, 100, 103, nullptr},
-      {3, 100, 98, "Aggressive submission day 2 of 3; triggering log submission"},
-      {3, {}, 1, "Aggressive submission day 1 of 3; triggering log submission"},
-      {{}, 100, 100, nullptr},
-      {"3", 100, 100, nullptr},
-      {-1, 100, 100, nullptr},
-      {2147483647, std::numeric_limits<std::int32_t>::min(), 2147483647, nullptr},
-  };
-  for (const auto& c : kCases) {
+  // The first column is the value of "AggressiveSubmissionDays".
+  using Case = std::tuple<plist::Value, plist::Value, std::int32_t, const char*>;
+  for (const auto& [days, updateDay, today, message] :
+       {Case(3, 100, 100, "Aggressive submission day 0 of 3; triggering log submission"),
+        Case(3, 100, 102, "Aggressive submission day 2 of 3; triggering log submission"),
+        Case(3, 100, 103, nullptr),
+        Case(3, 100, 98, "Aggressive submission day 2 of 3; triggering log submission"),
+        Case(3, {}, 1, "Aggressive submission day 1 of 3; triggering log submission"),
+        Case({}, 100, 100, nullptr), Case("3", 100, 100, nullptr), Case(-1, 100, 100, nullptr),
+        Case(2147483647, std::numeric_limits<std::int32_t>::min(), 2147483647, nullptr)}) {
     Dictionary update{{"version", "21A5"}};
-    update.set("day", c.updateDay);
+    update.set("day", updateDay);
     own = {{"LastOSUpdate", update}, {"TaskingID", "one"}, {"TaskingOS", "21A5"}};
     schedule({{"TaskingID", "one"}});
-    fake.store.today = c.today;
-    fake.submission.taskingValues.set("AggressiveSubmissionDays", c.days);
-    EXPECT_EQ(track(), c.message ? Journal{"submit now"} : Journal{}) << c.today;
-    EXPECT_EQ(fake.log.messages(), c.message ? Messages{c.message} : Messages{});
+    fake.store.today = today;
+    fake.submission.taskingValues.set("AggressiveSubmissionDays", days);
+    EXPECT_EQ(track(), message ? Journal{"submit now"} : Journal{}) << today;
+    EXPECT_EQ(fake.log.messages(), message ? Messages{message} : Messages{});
   }
   // Without a scheduled tasking, or one without an identifier, nothing is submitted either.
   fake.store.today = 100;

@@ -44,26 +44,21 @@ ChannelCallback answering(const WalkCase& row, std::string& seen) {
 }
 
 TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
-  const WalkCase kIterated[] = {{{0}, "abcdef", 0},       {{0, 2, 0, 4}, "abcdef", 6},
-                                {{0, 0, 1, 0}, "abc", 1}, {{2, 3}, "ab", 3},
-                                {{16}, "abcdef", 16},     {{0, -1, 2}, "ab", -1}};
-  const WalkCase kPruned[] = {{{16}, "abcdef", 16, ""},
-                              {{0}, "abcdef", 0},
-                              {{2}, "abcdef", 2},
-                              {{16, 0}, "abcdef", 16, "bdf"},
-                              {{0, 16, 16}, "abcdef", 16, "ad"},
-                              {{16, 2, 16, 1}, "abcd", 1, "bdef"},
-                              {{16, 17}, "ab", 17, "bcdef"}};
   for (const bool isTree : {false, true}) {
     const auto make = [&] {
       return isTree ? treeOf({"d-a", "dgb", "dgc", "e-d", "f-e", "f-f"}) : letters("abcdef");
     };
-    for (const WalkCase& row : kIterated) {
+    for (const auto& row : {WalkCase({0}, "abcdef", 0), WalkCase({0, 2, 0, 4}, "abcdef", 6),
+                            WalkCase({0, 0, 1, 0}, "abc", 1), WalkCase({2, 3}, "ab", 3),
+                            WalkCase({16}, "abcdef", 16), WalkCase({0, -1, 2}, "ab", -1)}) {
       std::string seen;
       EXPECT_EQ(IOReportIterate(make(), answering(row, seen)), row.result);
       EXPECT_EQ(seen, row.seen);
     }
-    for (const WalkCase& row : kPruned) {
+    for (const auto& row :
+         {WalkCase({16}, "abcdef", 16, ""), WalkCase({0}, "abcdef", 0), WalkCase({2}, "abcdef", 2),
+          WalkCase({16, 0}, "abcdef", 16, "bdf"), WalkCase({0, 16, 16}, "abcdef", 16, "ad"),
+          WalkCase({16, 2, 16, 1}, "abcd", 1, "bdef"), WalkCase({16, 17}, "ab", 17, "bcdef")}) {
       std::string seen;
       const Dictionary pruned = make();
       EXPECT_EQ(IOReportPrune(pruned, answering(row, seen)), row.result);
@@ -82,17 +77,11 @@ TEST(IterationTest, FailsForMalformedAggregates) {
   for (int i = 0; i < 200; ++i)
     deep = Dictionary{{"IOReportChannelGroups", Dictionary{{"g", deep}}}};
   const auto drivers = [](const Value& levels) { return Dictionary{{"IOReportDrivers", levels}}; };
-  const Dictionary kCases[] = {{},
-                               endless,
-                               deep,
-                               aggregateOf({5}),
-                               aggregateOf(5),
-                               drivers(5),
-                               aggregateOf({channelOf(7, 1, 1), "text"}),
-                               drivers(Dictionary::create()),
-                               {{"IOReportChannelGroups", Dictionary{{"g", 5}}}},
-                               drivers(Dictionary{{"d", aggregateOf({5})}})};
-  for (const Dictionary& aggregate : kCases) {
+  for (const Dictionary& aggregate :
+       {Dictionary(), endless, deep, aggregateOf({5}), aggregateOf(5), drivers(5),
+        aggregateOf({channelOf(7, 1, 1), "text"}), drivers(Dictionary::create()),
+        Dictionary{{"IOReportChannelGroups", Dictionary{{"g", 5}}}},
+        drivers(Dictionary{{"d", aggregateOf({5})}})}) {
     EXPECT_EQ(IOReportIterate(aggregate, kKeep), 273);
     EXPECT_EQ(IOReportGetChannelCount(aggregate), -1);
     EXPECT_FALSE(cloneAggregate(aggregate, kKeep));
@@ -199,16 +188,11 @@ TEST(PairingTest, FailsWhereTheOtherAggregateDiffersInShape) {
   const Dictionary ofD{{"IOReportDrivers", Dictionary{{"d", sample}}}};
   const Dictionary ofE{{"IOReportDrivers", Dictionary{{"e", sample}}}};
   const Dictionary none = aggregateOf(Array::create());
-  const std::pair<Dictionary, Dictionary> kCases[] = {{{}, sample},
-                                                      {Dictionary::create(), sample},
-                                                      {aggregateOf({5}), sample},
-                                                      {typeless, sample},
-                                                      {sample, typeless},
-                                                      {none, typeless},
-                                                      {sample, ofD},
-                                                      {noElements, sample},
-                                                      {ofE, ofD}};
-  for (const auto& [other, aggregate] : kCases)
+  using Case = std::pair<Dictionary, Dictionary>;
+  for (const auto& [other, aggregate] :
+       {Case({}, sample), Case(Dictionary::create(), sample), Case(aggregateOf({5}), sample),
+        Case(typeless, sample), Case(sample, typeless), Case(none, typeless), Case(sample, ofD),
+        Case(noElements, sample), Case(ofE, ofD)})
     EXPECT_FALSE(compareAggregates(other, aggregate, kKeep));
   EXPECT_EQ(compareAggregates(none, sample, kKeep), sample);
 }
@@ -248,16 +232,11 @@ TEST(SelectionTest, CopiesByCategoryFormatUnitAndGroup) {
 }
 
 TEST(GetterTest, NamesChannelsByLegendOrId) {
-  const std::pair<Array, Text> kCases[] = {{{1, 1, "named"}, "named"},
-                                           {{0x53544154, 1}, "STAT"},
-                                           {{0x41004200, 1}, "AB"},
-                                           {{0x7E20, 1, 5}, "~ "},
-                                           {{0x01020304, 1}, {}},
-                                           {{0x7F414243, 1}, {}},
-                                           {{0xE944, 1}, {}},
-                                           {{0, 1}, {}},
-                                           {{}, {}}};
-  for (const auto& [legend, name] : kCases) {
+  using Case = std::pair<Array, Text>;
+  for (const auto& [legend, name] :
+       {Case({1, 1, "named"}, "named"), Case({0x53544154, 1}, "STAT"), Case({0x41004200, 1}, "AB"),
+        Case({0x7E20, 1, 5}, "~ "), Case({0x01020304, 1}, {}), Case({0x7F414243, 1}, {}),
+        Case({0xE944, 1}, {}), Case({0, 1}, {}), Case({}, {})}) {
     const Dictionary channel{{"LegendChannel", legend}, {"DriverID", 1}};
     EXPECT_EQ(IOReportChannelGetChannelName(channel), name);
     EXPECT_EQ(channel.string("ChannelName"), name);

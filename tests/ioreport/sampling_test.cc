@@ -201,8 +201,7 @@ const DeltaCase kDeltas[] = {
     {3, {{{1}}}, {{{kNone}}}, {}},
     {3, {{{1, 0, 0, 5}}}, {{{2, 0, 0, kNone}}}, {}},
     {3, {{{1, 0, 0, kNone}}}, {{{2, 0, 0, 5}}}, {}},
-    {4, {{{1, kNone, 7, kNone}}}, {{{5, 7, kNone, kNone}}}, Sample{{{4, 7, 7, kNone}}}},
-};
+    {4, {{{1, kNone, 7, kNone}}}, {{{5, 7, kNone, kNone}}}, Sample{{{4, 7, 7, kNone}}}}};
 
 TEST(DeltaTest, SubtractsByFormat) {
   for (const auto& [format, previousElements, currentElements, expected] : kDeltas) {

@@ -124,22 +124,17 @@ Dictionary configured(const std::vector<Segment>& segments, std::size_t elements
 // Bounds that do not ascend, wrap, or are more than the elements fail; bytes behind the last whole
 // segment are not read.
 TEST(ValuesTest, WorksOutBucketBounds) {
-  const std::pair<Dictionary, Array> kCases[] = {
-      {configured({{2, 1, 4}, {20, 0, 3}}, 7), {2, 4, 8, 16, 20, 40, 60}},
-      {configured({{5, 0, 2}}, 7, 15), {5, 10}},
-      {configured({{9, 0, 0}, {9, 1, -1}, {3, 7, 2}, {1, 0, INT32_MIN}}, 2), {3, 9}},
-      {configured({{0x80000000, 1, 2}}, 2), {0x80000000, 0x4000000000000000}},
-      {configured({{20, 0, 3}, {2, 1, 4}}, 7), {}},
-      {configured({{1, 0, 3}}, 2), {}},
-      {configured({{1, 0, INT32_MAX}}, 65535), {}},
-      {configured({{0, 0, 1}}, 1), {}},
-      {configured({{1, 1, 2}}, 2), {}},
-      {configured({{0x80000000, 0, 2}}, 2), {}},
-      {configured({{0x10000, 1, 4}}, 4), {}},
-      {configured({}, 1, 15), {}},
-      {sampleOf(3, {{}}), {}},
-      {sampleOf(1, {{}}), {}}};
-  for (const auto& [channel, bounds] : kCases) {
+  using Case = std::pair<Dictionary, Array>;
+  for (const auto& [channel, bounds] :
+       {Case(configured({{2, 1, 4}, {20, 0, 3}}, 7), {2, 4, 8, 16, 20, 40, 60}),
+        Case(configured({{5, 0, 2}}, 7, 15), {5, 10}),
+        Case(configured({{9, 0, 0}, {9, 1, -1}, {3, 7, 2}, {1, 0, INT32_MIN}}, 2), {3, 9}),
+        Case(configured({{0x80000000, 1, 2}}, 2), {0x80000000, 0x4000000000000000}),
+        Case(configured({{20, 0, 3}, {2, 1, 4}}, 7), {}), Case(configured({{1, 0, 3}}, 2), {}),
+        Case(configured({{1, 0, INT32_MAX}}, 65535), {}), Case(configured({{0, 0, 1}}, 1), {}),
+        Case(configured({{1, 1, 2}}, 2), {}), Case(configured({{0x80000000, 0, 2}}, 2), {}),
+        Case(configured({{0x10000, 1, 4}}, 4), {}), Case(configured({}, 1, 15), {}),
+        Case(sampleOf(3, {{}}), {}), Case(sampleOf(1, {{}}), {})}) {
     std::int64_t expectedLower = 0;
     for (std::size_t i = 0; i < bounds.size(); ++i) {
       const std::int64_t expectedUpper = bounds.at(i).number()->int64();
@@ -185,19 +180,13 @@ constexpr std::uint64_t unit(std::uint64_t quantity, std::uint64_t scale, std::u
 }
 
 TEST(UnitTest, LabelsQuantitiesAndScales) {
-  const std::pair<std::uint64_t, const char*> kCases[] = {{0, ""},
-                                                          {unit(1, 0x7C), "ms"},
-                                                          {unit(7, 0x7C, 1), "H"},
-                                                          {unit(9, 0), "b"},
-                                                          {unit(9, 0, 1), ""},
-                                                          {unit(9, 0x8200), "B"},
-                                                          {unit(9, 0x8C00, 4), "4KiB"},
-                                                          {unit(101, 0x82), "kpackets"},
-                                                          {unit(11, 0x89 << 8), "Ki??"},
-                                                          {unit(1, 0x79, 0x80000018), "24Mticks"},
-                                                          {unit(77, 0x20000), "hwpage?"}};
-  for (const auto& [code, label] : kCases)
-    EXPECT_EQ(copyUnitLabel(static_cast<std::int64_t>(code)), label) << code;
+  std::string labels;
+  for (const std::uint64_t code :
+       {std::uint64_t{0}, unit(1, 0x7C), unit(7, 0x7C, 1), unit(9, 0), unit(9, 0, 1),
+        unit(9, 0x8200), unit(9, 0x8C00, 4), unit(101, 0x82), unit(11, 0x89 << 8),
+        unit(1, 0x79, 0x80000018), unit(77, 0x20000)})
+    labels += copyUnitLabel(static_cast<std::int64_t>(code)).value_or("none") + "|";
+  EXPECT_EQ(labels, "|ms|H|b||B|4KiB|kpackets|Ki??|24Mticks|hwpage?|");
   EXPECT_EQ(copyUnitLabel(kNone), std::nullopt);
 
   const Dictionary channel{{"IOReportChannelInfo", IOReportCreateUnitInfo(unit(1, 0x7C))}};

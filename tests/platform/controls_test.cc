@@ -32,44 +32,31 @@ class ControlsTest : public testing::Test {
 
 TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
   const std::byte bytes[] = {std::byte{1}, std::byte{2}, std::byte{3}};
-  writeList(kControls, plist::Dictionary{
-                           {"bytes", plist::Data(bytes)},
-                           {"twelve", 12},
-                           {"all ones", 4294967295},
-                           {"minus two", -2},
-                           {"fails", plist::Dictionary{{"errno", EPERM}}},
-                           {"no errno", plist::Dictionary{{"errno", 0}}},
-                           {"real", 1.5},
-                           {"vm.swapusage", 7},
-                       });
-  struct Case {
-    const char* name;
-    std::size_t size;
-    int errorNumber;
-    const char* content;  // hexadecimal, of the whole buffer
-  };
-  static constexpr Case kCases[] = {
-      {"bytes", 4, 0, "010203ee"},
-      {"bytes", 2, ENOMEM, "eeee"},
-      {"twelve", 8, 0, "0c00000000000000"},
-      {"twelve", 0, ENOMEM, ""},
-      {"all ones", 4, 0, "ffffffff"},
-      {"all ones", 3, ENOMEM, "eeeeee"},
-      {"minus two", 9, 0, "feffffffffffffffff"},
-      {"fails", 4, EPERM, "eeeeeeee"},
-      {"no errno", 4, EINVAL, "eeeeeeee"},
-      {"real", 4, EINVAL, "eeeeeeee"},
-      {"vm.swapusage", 16, 0, "07000000000000000000000000000000"},
-      {"kern.memorystatus_thaw_count", 4, ENOENT, "eeeeeeee"},
-  };
+  writeList(kControls, plist::Dictionary{{"bytes", plist::Data(bytes)},
+                                         {"twelve", 12},
+                                         {"all ones", 4294967295},
+                                         {"minus two", -2},
+                                         {"fails", plist::Dictionary{{"errno", EPERM}}},
+                                         {"no errno", plist::Dictionary{{"errno", 0}}},
+                                         {"real", 1.5},
+                                         {"vm.swapusage", 7}});
+  // The whole buffer is shown, in hexadecimal.
+  using Case = std::tuple<const char*, std::size_t, int, const char*>;
   LinuxSystemControls controls(device.root, files, coding, log);
-  for (const Case& row : kCases) {
-    std::vector<std::byte> buffer(row.size, std::byte{0xee});
-    const auto result = controls.read(row.name, buffer);
-    EXPECT_EQ(result.errorNumber, row.errorNumber) << row.name << ' ' << row.size;
+  for (const auto& [name, size, errorNumber, shown] :
+       {Case("bytes", 4, 0, "010203ee"), Case("bytes", 2, ENOMEM, "eeee"),
+        Case("twelve", 8, 0, "0c00000000000000"), Case("twelve", 0, ENOMEM, ""),
+        Case("all ones", 4, 0, "ffffffff"), Case("all ones", 3, ENOMEM, "eeeeee"),
+        Case("minus two", 9, 0, "feffffffffffffffff"), Case("fails", 4, EPERM, "eeeeeeee"),
+        Case("no errno", 4, EINVAL, "eeeeeeee"), Case("real", 4, EINVAL, "eeeeeeee"),
+        Case("vm.swapusage", 16, 0, "07000000000000000000000000000000"),
+        Case("kern.memorystatus_thaw_count", 4, ENOENT, "eeeeeeee")}) {
+    std::vector<std::byte> buffer(size, std::byte{0xee});
+    const auto result = controls.read(name, buffer);
+    EXPECT_EQ(result.errorNumber, errorNumber) << name << ' ' << size;
     std::string content;
     appendHex(content, buffer);
-    EXPECT_EQ(content, row.content) << row.name << ' ' << row.size;
+    EXPECT_EQ(content, shown) << name << ' ' << size;
   }
   const std::string path = device.root.path(kControls);
   const auto line = [&](const std::string& name) {

@@ -27,12 +27,8 @@ std::string zoneFile(std::string_view rule) {
 }
 
 TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
-  struct Case {
-    const char* rule;
-    double instant;  // seconds since 1970
-    const char* text;
-  };
-  static constexpr Case kCases[] = {
+  // The instants are seconds since 1970, the last in the year before year 1.
+  static constexpr std::tuple<const char*, double, const char*> kCases[] = {
       {"UTC0", 1794852138.75, "2026-11-16 18:02:18 +0000"},
       {"<+0545>-5:45", 1794852138, "2026-11-16 23:47:18 +0545"},
       {"<-0330>3:30", 0, "1969-12-31 20:30:00 -0330"},
@@ -41,15 +37,13 @@ TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
       {"CET-1CEST,M3.5.0,M10.5.0/3", 1774745999, "2026-03-29 01:59:59 +0100"},
       {"CET-1CEST,M3.5.0,M10.5.0/3", 1774746000, "2026-03-29 03:00:00 +0200"},
       {"<+14>-14", 253402300800, "10000-01-01 14:00:00 +1400"},
-      {"UTC0", -62135596801, "0001-12-31 23:59:59 +0000"},  // the year before year 1
-  };
-  for (const Case& row : kCases) {
+      {"UTC0", -62135596801, "0001-12-31 23:59:59 +0000"}};
+  for (const auto& [rule, instant, text] : kCases) {
     const TemporaryRoot device;  // a file of its own for each zone
-    device.write("/etc/localtime", zoneFile(row.rule));
+    device.write("/etc/localtime", zoneFile(rule));
     LinuxDateFormatting formatting(device.root);
-    EXPECT_EQ(formatting.format(plist::Date::since1970(row.instant), kPattern, "en_US_POSIX"),
-              row.text)
-        << row.rule;
+    EXPECT_EQ(formatting.format(plist::Date::since1970(instant), kPattern, "en_US_POSIX"), text)
+        << rule;
   }
 }
 

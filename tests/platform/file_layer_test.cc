@@ -25,13 +25,10 @@ TEST(FileLayer, ReadsRegularFilesOnlyAndUpToTheLimit) {
   EXPECT_EQ(*files.read(at("/full"), 5000), std::string(5000, 'x'));
   EXPECT_EQ(*files.readIfPresent(at("/none"), 10), std::nullopt);
 
-  const struct {
-    std::string_view path, reason;
-  } kRefused[] = {
+  const std::pair<std::string_view, std::string_view> kRefused[] = {
       {"/full", ": it has more than 4999 bytes; move it away"},
       {"/folder", ": it is a folder; move it away"},
-      {"/fifo", ": it is not a regular file; move it away"},
-  };
+      {"/fifo", ": it is not a regular file; move it away"}};
   for (const auto& [path, reason] : kRefused) {
     EXPECT_EQ(messageOf(files.read(at(path), 4999)),
               "cannot use " + at(path) + std::string(reason));
@@ -66,22 +63,19 @@ TEST(FileLayer, ReplacesWholeFilesAndKeepsTheirMode) {
 TEST(FileLayer, RemovesTemporaryFilesOnceTheyAreOld) {
   const TemporaryRoot device;
   const auto now = fs::file_time_type::clock::now();
-  const struct {
-    const char* name;
-    int hours;
-    bool stays;
-  } kFiles[] = {{"/d/.tavrel-0000000000000001.tmp", 25, false},
-                {"/d/.tavrel-0000000000000002.tmp", 23, true},
-                {"/d/.tavrel-0000000000000003.tmp", -25, false},  // the clock was set back
-                {"/d/tavrel-0000000000000005.tmp", 25, true}};
-  for (const auto& file : kFiles) {
-    device.write(file.name, "x");
-    fs::last_write_time(device.root.path(file.name), now - std::chrono::hours(file.hours));
+  const std::tuple<const char*, int, bool> kFiles[] = {
+      {"/d/.tavrel-0000000000000001.tmp", 25, false},
+      {"/d/.tavrel-0000000000000002.tmp", 23, true},
+      {"/d/.tavrel-0000000000000003.tmp", -25, false},  // the clock was set back
+      {"/d/tavrel-0000000000000005.tmp", 25, true}};
+  for (const auto& [name, age, stays] : kFiles) {
+    device.write(name, "x");
+    fs::last_write_time(device.root.path(name), now - std::chrono::hours(age));
   }
   FileLayer files;
   ASSERT_TRUE(files.replace(device.root.path("/d/file"), asBytes("x"), 0644));
-  for (const auto& file : kFiles)
-    EXPECT_EQ(fs::exists(device.root.path(file.name)), file.stays) << file.name;
+  for (const auto& [name, age, stays] : kFiles)
+    EXPECT_EQ(fs::exists(device.root.path(name)), stays) << name;
 }
 
 TEST(FileLayer, AppendsWholeLines) {

@@ -19,23 +19,13 @@ TEST(LanguageTag, ReadsTagsAndNamesOfLocales) {
     const char* tag;  // empty: no language
     const char* script = "Latn";
   };
-  static constexpr Case kCases[] = {
-      {"de_AT.UTF-8@euro", "de-AT"},
-      {"sr_RS@latin", "sr-Latn-RS"},
-      {"zh_TW.Big5", "zh-TW", "Hant"},
-      {"zh-hant-hk", "zh-Hant-HK", "Hant"},
-      {"tt_RU@iqtelif", "tt-Latn-RU"},
-      {"ca_ES@valencia", "ca-ES-valencia"},
-      {"de-CH-1996-u-co-phonebk", "de-CH-1996"},
-      {"iw_IL", "he-IL", "Hebr"},
-      {"no_NO", "nb-NO"},
-      {"C", ""},
-      {"german", ""},
-      {"de_", "de"},
-      {"de_\xff\xff", ""},
-      {"../../etc", ""},
-  };
-  for (const Case& row : kCases) {
+  for (const Case& row :
+       {Case("de_AT.UTF-8@euro", "de-AT"), Case("sr_RS@latin", "sr-Latn-RS"),
+        Case("zh_TW.Big5", "zh-TW", "Hant"), Case("zh-hant-hk", "zh-Hant-HK", "Hant"),
+        Case("tt_RU@iqtelif", "tt-Latn-RU"), Case("ca_ES@valencia", "ca-ES-valencia"),
+        Case("de-CH-1996-u-co-phonebk", "de-CH-1996"), Case("iw_IL", "he-IL", "Hebr"),
+        Case("no_NO", "nb-NO"), Case("C", ""), Case("german", ""), Case("de_", "de"),
+        Case("de_\xff\xff", ""), Case("../../etc", "")}) {
     const auto tag = parseLanguageTag(row.name);
     EXPECT_EQ(tag ? tag->text() : "", row.tag) << row.name;
     EXPECT_TRUE(!tag || tag->effectiveScript() == row.script) << row.name;
@@ -43,10 +33,7 @@ TEST(LanguageTag, ReadsTagsAndNamesOfLocales) {
 }
 
 TEST(LanguageMatching, PrefersRegionThenParentThenLanguageAndNeverCrossesScripts) {
-  struct Case {
-    Names available, preferred, matches;
-  };
-  const Case cases[] = {
+  const std::tuple<Names, Names, Names> cases[] = {
       {{"en", "de", "de-AT"}, {"de-AT"}, {"de-AT", "de"}},
       {{"en", "de-CH", "de-DE", "de"}, {"de-AT"}, {"de", "de-DE", "de-CH"}},
       {{"fr-CA", "fr-FR"}, {"fr"}, {"fr-FR", "fr-CA"}},
@@ -60,12 +47,10 @@ TEST(LanguageMatching, PrefersRegionThenParentThenLanguageAndNeverCrossesScripts
       {{"ca-ES-valencia", "ca", "ca-FR"}, {"ca-ES"}, {"ca", "ca-FR", "ca-ES-valencia"}},
       {{"en", "no", "da"}, {"nb-NO", "da-DK", "nb"}, {"no", "da"}},
       {{"de", "de", "C", "?"}, {"?", "de", "de"}, {"de"}},
-      {{"xx-1", "en"}, {"ja"}, {"xx-1"}},
-  };
-  for (const Case& row : cases) {
-    EXPECT_EQ(matchLanguages(row.available, row.preferred), row.matches)
-        << testing::PrintToString(row.available) << " for "
-        << testing::PrintToString(row.preferred);
+      {{"xx-1", "en"}, {"ja"}, {"xx-1"}}};
+  for (const auto& [available, preferred, matches] : cases) {
+    EXPECT_EQ(matchLanguages(available, preferred), matches)
+        << testing::PrintToString(available) << " for " << testing::PrintToString(preferred);
   }
   Names many(limits::kLanguages, "?");
   many.push_back("de");
@@ -80,12 +65,8 @@ class LocaleTest : public testing::Test {
 };
 
 TEST_F(LocaleTest, TakesPreferencesAndCountryFromTheConfiguration) {
-  struct Case {
-    const char* file;
-    Names preferred;
-    const char* country;  // empty: none
-  };
-  const Case cases[] = {
+  // The last column is the country, empty for none.
+  const std::tuple<const char*, Names, const char*> cases[] = {
       {"# LANG=fr\n export LANG=\"de_AT.UTF-8\"  # x\nLANGUAGE='de:fr:de'\n",
        {"de", "fr", "de-AT"},
        "AT"},
@@ -93,14 +74,13 @@ TEST_F(LocaleTest, TakesPreferencesAndCountryFromTheConfiguration) {
       {"LANG=C.UTF-8\nLANGUAGE=de\n", {}, ""},
       {"LANG=en_US\nLANGUAGE=::de:C:fr\n", {"de"}, "US"},
       {"LANG=de_DE\nLC_MEASUREMENT=C\n", {"de-DE"}, ""},
-      {"LANG\n=\nLANG=\x01\xff\n", {}, ""},
-  };
+      {"LANG\n=\nLANG=\x01\xff\n", {}, ""}};
   device.write("/etc/default/locale", "LANG=pl_PL.UTF-8\n");
   EXPECT_EQ(locale.preferredLanguages(), Names{"pl-PL"});
-  for (const Case& row : cases) {
-    device.write("/etc/locale.conf", row.file);
-    EXPECT_EQ(locale.preferredLanguages(), row.preferred) << row.file;
-    EXPECT_EQ(locale.countryCode().value_or(""), row.country) << row.file;
+  for (const auto& [file, preferred, country] : cases) {
+    device.write("/etc/locale.conf", file);
+    EXPECT_EQ(locale.preferredLanguages(), preferred) << file;
+    EXPECT_EQ(locale.countryCode().value_or(""), country) << file;
   }
   EXPECT_EQ(log.lines, Names{});
 }

@@ -145,12 +145,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
   ASSERT_EQ(ftruncate(huge.get(), (16 << 20) + 1), 0);
   ASSERT_EQ(fcntl(huge.get(), F_ADD_SEALS, kAllSeals), 0);
   const Descriptor ordinary(open("/proc/self/exe", O_RDONLY | O_CLOEXEC));
-  struct Case {
-    std::string packet;
-    std::vector<int> files;
-    const char* reason;
-  };
-  const std::vector<Case> cases = {
+  const std::tuple<std::string, std::vector<int>, const char*> cases[] = {
       {"garbage", {}, ""},
       {"", {}, "the packet is empty"},
       {*plist::writeXml(plist::Array{1}), {}, "the message is no dictionary"},
@@ -160,21 +155,20 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
       {"", {unsealed.get()}, "not sealed against shrinking, growing and writing"},
       {"", {ordinary.get()}, "no memory file that can be sealed"},
       {"", {huge.get()}, "the memory file has 16777217 bytes, the limit is 16777216"},
-      {"", {noMessage.get()}, ""},
-  };
+      {"", {noMessage.get()}, ""}};
   std::size_t before = 0;
-  for (const Case& bad : cases) {
-    SCOPED_TRACE(testing::PrintToString(bad.packet.substr(0, 20)) + " " + bad.reason);
+  for (const auto& [packet, files, reason] : cases) {
+    SCOPED_TRACE(testing::PrintToString(packet.substr(0, 20)) + " " + reason);
     log.lines.clear();
     closures = 0;
     const ServiceClient client = connect();
-    sendRaw(client, asBytes(bad.packet), bad.files);
+    sendRaw(client, asBytes(packet), files);
     sendRaw(client, goodBytes);
     EXPECT_EQ(drain(), 1) << "only the new peer is an event";
     ASSERT_EQ(log.lines.size(), 1U);
     EXPECT_TRUE(log.says(std::string(kName) + ": dropped peer " + std::to_string(getpid()) +
                          " (user " + std::to_string(getuid()) + "): "));
-    EXPECT_TRUE(log.says(bad.reason)) << log.lines.front();
+    EXPECT_TRUE(log.says(reason)) << log.lines.front();
     EXPECT_EQ(closures, 1);
     EXPECT_TRUE(messages.empty()) << "what a dropped peer sent later is not read";
     if (before == 0) before = openDescriptors();

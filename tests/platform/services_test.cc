@@ -61,15 +61,12 @@ TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
   utsname kernel{};
   ASSERT_EQ(uname(&kernel), 0);
   const std::string release = kernel.release;
-  const struct {
-    std::string osRelease, text;
-  } kCases[] = {
+  const std::pair<std::string, std::string> kCases[] = {
       {"NAME=\"Debian GNU/Linux\"\nVERSION_ID=\"12\"\n",
        "Debian GNU/Linux 12 (12-" + release + ")"},
       {"# NAME=no\n NAME='A \"b\" \\c'\r\nVERSION_ID=1\nNAMES=no\nBUILD_ID=20.1",
        "A \"b\" \\c 1 (20.1)"},
-      {"", "(" + release + ")"},
-  };
+      {"", "(" + release + ")"}};
   for (const auto& [osRelease, text] : kCases) {
     Services device;
     device.write("/usr/lib/os-release", osRelease);

@@ -134,30 +134,21 @@ TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
   EXPECT_EQ(scalars(*history, "", kToday - 1, kToday), today);
 
   // Bounds exclude the lower and include the upper day; several days come by key, then by day.
-  const struct {
-    std::string prefix;
-    std::int64_t min, max;
-    Rows rows;
-  } cases[] = {
-      {"a", kToday - 1, kToday, {today[2], today[3], today[4], today[5]}},
-      {nul, kToday - 1, kToday, {today[3]}},
-      {"\xFF", kToday - 1, kToday, {today[8], today[9]}},
-      {"\xFF\xFF", kToday - 2, kToday, {today[9]}},
-      {"b", kToday - 1, kToday, {}},
-      {"", kToday, kToday, {}},
-      {"", kToday, kToday - 1, {}},
-      {"", kFirstDay, kToday - 1, {{"a", kToday - 1, 7}}},
-      {"", std::int64_t{kFirstDay} - 1, kFirstDay, {{"a", kFirstDay, 8}}},
-      {"", std::int64_t{kLastDay} - 1, kLastDay, {{"a", kLastDay, 9}, {"b", kLastDay, 10}}},
-      {"", kLargest, kLargest, {}},
-      {"", kSmallest, kSmallest, {}},
-      {"a", kSmallest, kToday - 1, {{"a", kFirstDay, 8}, {"a", kToday - 1, 7}}},
-      {"b", kSmallest, kLargest, {{"b", kLastDay, 10}}},
-      {"\xFF", kSmallest, kLargest, {today[8], today[9]}},
-  };
-  for (const auto& item : cases) {
-    EXPECT_EQ(scalars(*history, item.prefix, item.min, item.max), item.rows)
-        << item.prefix << ' ' << item.min << ' ' << item.max;
+  using Case = std::tuple<std::string, std::int64_t, std::int64_t, Rows>;
+  for (const auto& [prefix, min, max, rows] :
+       {Case("a", kToday - 1, kToday, {today[2], today[3], today[4], today[5]}),
+        Case(nul, kToday - 1, kToday, {today[3]}),
+        Case("\xFF", kToday - 1, kToday, {today[8], today[9]}),
+        Case("\xFF\xFF", kToday - 2, kToday, {today[9]}), Case("b", kToday - 1, kToday, {}),
+        Case("", kToday, kToday, {}), Case("", kToday, kToday - 1, {}),
+        Case("", kFirstDay, kToday - 1, {{"a", kToday - 1, 7}}),
+        Case("", std::int64_t{kFirstDay} - 1, kFirstDay, {{"a", kFirstDay, 8}}),
+        Case("", std::int64_t{kLastDay} - 1, kLastDay, {{"a", kLastDay, 9}, {"b", kLastDay, 10}}),
+        Case("", kLargest, kLargest, {}), Case("", kSmallest, kSmallest, {}),
+        Case("a", kSmallest, kToday - 1, {{"a", kFirstDay, 8}, {"a", kToday - 1, 7}}),
+        Case("b", kSmallest, kLargest, {{"b", kLastDay, 10}}),
+        Case("\xFF", kSmallest, kLargest, {today[8], today[9]})}) {
+    EXPECT_EQ(scalars(*history, prefix, min, max), rows) << prefix << ' ' << min << ' ' << max;
   }
 
   int calls = 0;
@@ -244,25 +235,21 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   batch->reset();
   const std::string whole = contentOf(store_->path());
   const std::string ofBad = " WHERE key = CAST('bad' || char(10) AS BLOB)";
-  const struct {
-    std::string change, reason;
-    bool readsSome = false;
-  } cases[] = {
+  const std::tuple<std::string, std::string, int> cases[] = {
       {"UPDATE chunks SET data = x'00' WHERE chunk = 0",
-       "its values are not in the form that this program writes"},
-      {"DELETE FROM chunks WHERE chunk = 0", "it does not hold the 1 values that it counts"},
+       "its values are not in the form that this program writes", 0},
+      {"DELETE FROM chunks WHERE chunk = 0", "it does not hold the 1 values that it counts", 0},
       {"UPDATE distributions SET count = 2" + ofBad, "it does not hold the 2 values that it counts",
-       true},
-      {"UPDATE distributions SET count = 0" + ofBad,
-       "it does not hold the 0 values that it counts"},
+       1},
+      {"UPDATE distributions SET count = 0" + ofBad, "it does not hold the 0 values that it counts",
+       0},
       {"DELETE FROM chunks WHERE chunk = 0; UPDATE distributions SET count = -1" + ofBad,
-       "it does not hold the -1 values that it counts"},
-      {"UPDATE distributions SET series = -1" + ofBad, "it refers to values that cannot exist"},
-  };
-  for (const auto& item : cases) {
-    SCOPED_TRACE(item.change);
+       "it does not hold the -1 values that it counts", 0},
+      {"UPDATE distributions SET series = -1" + ofBad, "it refers to values that cannot exist", 0}};
+  for (const auto& [change, reason, valuesRead] : cases) {
+    SCOPED_TRACE(change);
     root_.write(kStorePath, whole);
-    sql(item.change);
+    sql(change);
     log_.lines.clear();
     const auto history = store_->openHistory();
     Lines seen;
@@ -280,14 +267,14 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
     EXPECT_TRUE(walk("bad\n"));
     const std::string line = "statistics store " + store_->path() +
                              ": distribution \"bad\\n\" of day " + std::to_string(kToday) + ": " +
-                             item.reason + ": restore the file from a copy or move it away";
+                             reason + ": restore the file from a copy or move it away";
     EXPECT_EQ(walk("").error().message, line);
     (*history)->distributionsForKeyPrefix(
         "", kToday - 1, kToday,
         [&](std::string_view key, std::int32_t, BHHistoryDistributionEnumerator& values, bool&) {
           see(key, values);
         });
-    const std::string bad = item.readsSome ? "bad\n1 failed" : "bad\n0 failed";
+    const std::string bad = "bad\n" + std::to_string(valuesRead) + " failed";
     EXPECT_EQ(seen, (Lines{"good1", bad, "good1", bad, "good1"}));
     EXPECT_EQ(log_.lines, Lines{line});
   }
@@ -398,12 +385,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   std::string flipped = good;
   for (std::size_t i = 65'536; i < flipped.size(); i += 7)
     flipped[i] ^= 0x55;
-  const struct {
-    const char* name;
-    std::string content;
-    bool damaged;
-    const char* reason;
-  } cases[] = {
+  const std::tuple<const char*, std::string, bool, const char*> cases[] = {
       {"empty", "", false, nullptr},
       {"good", good, false, nullptr},
       {"garbage", std::string(10'000, 'x'), true, "file is not a database"},
@@ -415,17 +397,16 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
        "has schema version 2, which this program does not know (it knows 1), and is left alone: "
        "update tavrel, or move the file away"},
       {"foreign", foreign, false,
-       "holds the tables of another program and is left alone: move it away"},
-  };
-  for (const auto& item : cases) {
+       "holds the tables of another program and is left alone: move it away"}};
+  for (const auto& [name, content, damaged, reason] : cases) {
     for (const bool byReader : {true, false}) {
-      SCOPED_TRACE(std::string(item.name) + (byReader ? ", read" : ", written"));
+      SCOPED_TRACE(std::string(name) + (byReader ? ", read" : ", written"));
       store_ = open();
       for (const auto& file : setAsideFiles())
         std::filesystem::remove(file);
       for (const char* suffix : {"", "-wal", "-shm"})
         std::filesystem::remove(store_->path() + suffix);
-      root_.write(kStorePath, item.content);
+      root_.write(kStorePath, content);
       log_.lines.clear();
       preferences_.ZTXPreferencesSetValue("DatabaseCorruptionCount", {}, "com.norvane.tallied");
 
@@ -436,26 +417,26 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
         store_->BHClientCheckpoint();
       }
       const std::string where = "statistics store " + store_->path() + ": ";
-      if (item.damaged) {
+      if (damaged) {
         const std::string aside = store_->path() + ".corrupt-20261127T180218Z";
         ASSERT_EQ(log_.lines.size(), byReader ? log_.lines.size() : 1U);
-        EXPECT_EQ(log_.lines[0], where + item.reason +
-                                     ": the file has to be set aside; it is now " + aside +
+        EXPECT_EQ(log_.lines[0], where + reason + ": the file has to be set aside; it is now " +
+                                     aside +
                                      " and a new store is begun: inspect or remove that file");
-        EXPECT_EQ(contentOf(aside), item.content);
+        EXPECT_EQ(contentOf(aside), content);
         EXPECT_EQ(corruptions(), 1);
       } else {
         EXPECT_EQ(setAsideFiles(), Lines{});
         EXPECT_EQ(corruptions(), 0);
-        if (item.reason) {
+        if (reason) {
           scalarsOfToday();
           store_->BHClientCheckpoint();
-          EXPECT_EQ(log_.lines, (Lines{where + item.reason +
+          EXPECT_EQ(log_.lines, (Lines{where + reason +
                                        (byReader ? "" : "; 1 values wait for the next commit")}));
-          EXPECT_EQ(contentOf(store_->path()), item.content);
+          EXPECT_EQ(contentOf(store_->path()), content);
         }
       }
-      const bool kept = !item.reason || item.damaged;
+      const bool kept = !reason || damaged;
       if (!byReader) {
         EXPECT_EQ(store_->commit(), kept);
       }

@@ -39,36 +39,27 @@ std::string errorOf(const std::string& bytes) {
 }
 
 TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
-  const struct {
-    Value value;
-    std::string object;
-  } rows[] = {
-      {true, "\x09"s},
-      {std::int8_t{7}, "\x10\x07"s},
-      {256, "\x11\x01\x00"s},
-      {0xFFFFFFFF, "\x12\xFF\xFF\xFF\xFF"s},
-      {std::uint64_t{1} << 63, "\x14\0\0\0\0\0\0\0\0\x80\0\0\0\0\0\0\0"s},
-      {1.5F, "\x22\x3F\xC0\0\0"s},
-      {-0.0, "\x23\x80\0\0\0\0\0\0\0"s},
-      {Date::sinceEpoch(0.5), "\x33\x3F\xE0\0\0\0\0\0\0"s},
-      {"", "\x50"s},
-      {"fourteen chars", "\x5E\x66ourteen chars"s},
-      {"fifteen letters", "\x5F\x10\x0F\x66ifteen letters"s},
-      {"\xC3\xA9\xF0\x9F\x98\x80", "\x63\0\xE9\xD8\x3D\xDE\0"s},
-      {Data(asBytes("\1\2\3")), "\x43\1\2\3"s},
-      {Array::create(), "\xA0"s},
-      {Dictionary::create(), "\xD0"s},
-  };
-  for (const auto& row : rows) {
-    const auto binary = writeBinary(row.value);
+  using Case = std::pair<Value, std::string>;
+  for (const auto& [value, object] :
+       {Case(true, "\x09"s), Case(std::int8_t{7}, "\x10\x07"s), Case(256, "\x11\x01\x00"s),
+        Case(0xFFFFFFFF, "\x12\xFF\xFF\xFF\xFF"s),
+        Case(std::uint64_t{1} << 63, "\x14\0\0\0\0\0\0\0\0\x80\0\0\0\0\0\0\0"s),
+        Case(1.5F, "\x22\x3F\xC0\0\0"s), Case(-0.0, "\x23\x80\0\0\0\0\0\0\0"s),
+        Case(Date::sinceEpoch(0.5), "\x33\x3F\xE0\0\0\0\0\0\0"s), Case("", "\x50"s),
+        Case("fourteen chars", "\x5E\x66ourteen chars"s),
+        Case("fifteen letters", "\x5F\x10\x0F\x66ifteen letters"s),
+        Case("\xC3\xA9\xF0\x9F\x98\x80", "\x63\0\xE9\xD8\x3D\xDE\0"s),
+        Case(Data(asBytes("\1\2\3")), "\x43\1\2\3"s), Case(Array::create(), "\xA0"s),
+        Case(Dictionary::create(), "\xD0"s)}) {
+    const auto binary = writeBinary(value);
     ASSERT_TRUE(binary) << binary.error().message;
-    EXPECT_EQ(*binary, document({row.object}));
-    const auto value = readBinary(asBytes(*binary));
-    ASSERT_TRUE(value) << value.error().message;
-    EXPECT_EQ(*value, row.value);
-    if (const auto number = row.value.number(); number && number->isFloating()) {
-      EXPECT_EQ(value->number()->kind(), number->kind());
-      EXPECT_EQ(std::signbit(value->number()->real()), std::signbit(number->real()));
+    EXPECT_EQ(*binary, document({object}));
+    const auto back = readBinary(asBytes(*binary));
+    ASSERT_TRUE(back) << back.error().message;
+    EXPECT_EQ(*back, value);
+    if (const auto number = value.number(); number && number->isFloating()) {
+      EXPECT_EQ(back->number()->kind(), number->kind());
+      EXPECT_EQ(std::signbit(back->number()->real()), std::signbit(number->real()));
     }
   }
 }
@@ -117,10 +108,8 @@ TEST(Binary, HostileObjectsAreRefused) {
   for (char i = 2; i < 9; ++i)
     expanding.push_back("\xAA"s + std::string(10, i));
   expanding.push_back("\x09"s);
-  const struct {
-    std::vector<std::string> objects;
-    std::string error;  // behind "offset "
-  } rows[] = {
+  // The errors follow "offset ".
+  const std::pair<std::vector<std::string>, std::string> rows[] = {
       {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of no type that is read"},
       {{"\x15"s}, "8: an integer of more than 16 bytes"},
       {{"\x14\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\1\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
@@ -135,10 +124,9 @@ TEST(Binary, HostileObjectsAreRefused) {
       {{"\xA1\1"s}, "9: a reference to object 1, where there are 1"},
       {{"\xD1\1\1"s, "\x09"s}, "11: a key is no text"},
       {{"\xA1\1"s, "\xD1\2\0"s, "\x51\x61"s}, "8: a container contains itself"},
-      {expanding, "85: there are more than 1000000 values, after shared references are expanded"},
-  };
-  for (const auto& row : rows)
-    EXPECT_EQ(errorOf(document(row.objects)), "binary property list, offset " + row.error);
+      {expanding, "85: there are more than 1000000 values, after shared references are expanded"}};
+  for (const auto& [objects, error] : rows)
+    EXPECT_EQ(errorOf(document(objects)), "binary property list, offset " + error);
 
   std::vector<std::string> nested;
   for (int i = 1; i < 129; ++i)
@@ -153,10 +141,7 @@ TEST(Binary, HostileObjectsAreRefused) {
 TEST(Binary, HostileTrailersAreRefused) {
   const std::string good = document({"\x09"s});  // table at 9, trailer at 10
   ASSERT_EQ(errorOf(good), "no error");
-  const struct {
-    std::size_t at;
-    std::string bytes, error;
-  } rows[] = {
+  const std::tuple<std::size_t, std::string, std::string> rows[] = {
       {0, "bplist15", "0: it does not begin with \"bplist00\""},
       {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},
       {16, "\2"s, "18: the table of offsets has no room for 1 objects"},
@@ -165,12 +150,11 @@ TEST(Binary, HostileTrailersAreRefused) {
       {26, "\0\0\0\0\0\0\0\1"s, "26: a reference to object 1, where there are 1"},
       {34, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "34: the table of offsets begins at 18446744073709551615, outside the document"},
-      {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"},
-  };
-  for (const auto& row : rows) {
+      {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"}};
+  for (const auto& [at, change, error] : rows) {
     std::string bytes = good;
-    bytes.replace(row.at, row.bytes.size(), row.bytes);
-    EXPECT_EQ(errorOf(bytes), "binary property list, offset " + row.error);
+    bytes.replace(at, change.size(), change);
+    EXPECT_EQ(errorOf(bytes), "binary property list, offset " + error);
   }
   for (std::size_t length = 8; length < good.size(); ++length)
     EXPECT_NE(errorOf(good.substr(0, length)), "no error") << length;

@@ -29,8 +29,7 @@ TEST(Xml, WritesSortedIndentedDocument) {
       {"b", Array{1, -2, true, false, Array::create(), Dictionary::create()}},
       {"a<&>", "x<y>&\r\n\"'"},
       {"c", Dictionary{{"when", Date::sinceEpoch(-0.25)}, {"bytes", Data(bytes)}}},
-      {"\xC3\xA9", ""},
-  };
+      {"\xC3\xA9", ""}};
   EXPECT_EQ(*writeXml(document),
             wrapped("<dict>\n"
                     "\t<key>a&lt;&amp;&gt;</key>\n"
@@ -52,30 +51,24 @@ TEST(Xml, WritesSortedIndentedDocument) {
 }
 
 TEST(Xml, ScalarsAreWrittenAndReadBack) {
-  const struct {
-    Value value;
-    std::string text;
-  } rows[] = {
-      {std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"},
-      {std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"},
-      {0.1F, "<real>0.10000000149011612</real>"},
-      {-0.0, "<real>-0</real>"},
-      {5e-324, "<real>5e-324</real>"},
-      {-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"},
-      {Date::ofDay(std::numeric_limits<std::int32_t>::min()),
-       "<date>-5877641-06-23T00:00:00Z</date>"},
-      {Data(asBytes("ab")), "<data>\nYWI=\n</data>"},
-      {Data(ByteSpan()), "<data>\n</data>"},
-      {" \t\n\r ", "<string> \t\n&#13; </string>"},
-      {"\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>"},
-  };
-  for (const auto& row : rows) {
-    const auto xml = writeXml(row.value);
-    ASSERT_TRUE(xml) << row.text;
-    EXPECT_EQ(*xml, wrapped(row.text + "\n"));
-    const auto value = readXml(asBytes(*xml));
-    ASSERT_TRUE(value) << value.error().message;
-    EXPECT_EQ(*value, row.value) << row.text;
+  using Case = std::pair<Value, std::string>;
+  for (const auto& [value, text] :
+       {Case(std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"),
+        Case(std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"),
+        Case(0.1F, "<real>0.10000000149011612</real>"), Case(-0.0, "<real>-0</real>"),
+        Case(5e-324, "<real>5e-324</real>"),
+        Case(-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"),
+        Case(Date::ofDay(std::numeric_limits<std::int32_t>::min()),
+             "<date>-5877641-06-23T00:00:00Z</date>"),
+        Case(Data(asBytes("ab")), "<data>\nYWI=\n</data>"),
+        Case(Data(ByteSpan()), "<data>\n</data>"), Case(" \t\n\r ", "<string> \t\n&#13; </string>"),
+        Case("\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>")}) {
+    const auto xml = writeXml(value);
+    ASSERT_TRUE(xml) << text;
+    EXPECT_EQ(*xml, wrapped(text + "\n"));
+    const auto back = readXml(asBytes(*xml));
+    ASSERT_TRUE(back) << back.error().message;
+    EXPECT_EQ(*back, value) << text;
   }
   EXPECT_TRUE(std::signbit(readXml(asBytes(wrapped("<real>-0</real>")))->number()->real()));
 }
@@ -106,10 +99,7 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
   for (int i = 0; i < 14; ++i)
     large.append(text);
 
-  const struct {
-    Value value;
-    std::string error;
-  } rows[] = {
+  const std::pair<Value, std::string> rows[] = {
       {Dictionary{{"a", Array{1, Value()}}},
        "cannot encode the property list, value /a/1: null has no encoding"},
       {Date::sinceEpoch(1e300),
@@ -117,11 +107,10 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
       {Value(cyclic),
        "cannot encode the property list: containers nest deeper than 128, or one contains itself"},
       {wide, "cannot encode the property list: it has more than 1000000 values"},
-      {large, "cannot encode the property list: the document is longer than 67108864 bytes"},
-  };
-  for (const auto& row : rows) {
-    const auto xml = writeXml(row.value);
-    EXPECT_EQ(xml ? "no error" : xml.error().message, row.error);
+      {large, "cannot encode the property list: the document is longer than 67108864 bytes"}};
+  for (const auto& [value, error] : rows) {
+    const auto xml = writeXml(value);
+    EXPECT_EQ(xml ? "no error" : xml.error().message, error);
   }
   cyclic.remove(1);
   EXPECT_EQ(*readXml(asBytes(*writeXml(deepest))), Value(deepest));
@@ -152,10 +141,8 @@ TEST(Xml, ReadsWhatOthersWrite) {
 }
 
 TEST(Xml, ErrorsSayWhatAndWhere) {
-  const struct {
-    std::string body;
-    std::string error;  // behind "line 3, column "
-  } rows[] = {
+  // The reasons follow "line 3, column ".
+  const std::pair<std::string, std::string> rows[] = {
       {"", "1: <plist> holds no value"},
       {"<true/><true/>", "8: <true> is a second value"},
       {"<key>a</key>", "1: <key> stands outside <dict>"},
@@ -171,11 +158,10 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
       {"<real>1e999</real>", "12: \"1e999\" is no real number that a double holds"},
       {"<date>2026-02-29T00:00:00Z</date>",
        "27: \"2026-02-29T00:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
-      {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"},
-  };
-  for (const auto& row : rows) {
-    const std::string error = errorOf(wrapped(row.body));
-    EXPECT_EQ(error, "XML property list, line 3, column " + row.error) << row.body;
+      {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"}};
+  for (const auto& [body, reason] : rows) {
+    const std::string error = errorOf(wrapped(body));
+    EXPECT_EQ(error, "XML property list, line 3, column " + reason) << body;
   }
   EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
             "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is no integer of 64 bits");

@@ -35,8 +35,7 @@ TEST(HistogramTest, SearchesAsTheWalkDoes) {
       {"text", 3, true, 7.5},
       {-kInfinity, 0, kInfinity, 5},
       {-0.0, 0.0, 4.9e-324},
-      {std::int64_t{9007199254740993}, std::uint64_t{18446744073709551615U}},
-  };
+      {std::int64_t{9007199254740993}, std::uint64_t{18446744073709551615U}}};
   for (const plist::Array& list : kLists) {
     const auto histogram = Histogram::create(list);
     ASSERT_TRUE(histogram);

@@ -82,24 +82,19 @@ TEST_F(ProbesTest, TakeTheCorruptionCount) {
   preferences = {{"DatabaseCorruptionCount", 3}};
 
   // Whatever of the library is missing, the count is left alone.
-  const struct {
-    bool isPresent;
-    std::set<std::string, std::less<>> missing;
-    Messages messages;
-  } kCases[] = {
+  const std::tuple<bool, std::set<std::string, std::less<>>, Messages> kCases[] = {
       {false, {}, {"Failed to dynamically load the FaultlineSupport framework"}},
       {true,
        {"ZTXPreferencesGetIntegerValue", "ZTXPreferencesSetValue"},
        {"Failed to dyanmically link ZTXPreferencesGetIntegerValue",
         "Failed to dynamically link ZTXPreferencesSetValue"}},
-      {true, {"ZTXPreferencesSetValue"}, {"Failed to dynamically link ZTXPreferencesSetValue"}},
-  };
-  for (const auto& c : kCases) {
-    fake.loader.isPresent = c.isPresent;
-    fake.loader.missing = c.missing;
+      {true, {"ZTXPreferencesSetValue"}, {"Failed to dynamically link ZTXPreferencesSetValue"}}};
+  for (const auto& [isPresent, missing, messages] : kCases) {
+    fake.loader.isPresent = isPresent;
+    fake.loader.missing = missing;
     fake.log.entries.clear();
     EXPECT_EQ(probe(kCorruptions), plist::Value(0));
-    EXPECT_EQ(fake.log.messages(LogLevel::Error), c.messages);
+    EXPECT_EQ(fake.log.messages(LogLevel::Error), messages);
     EXPECT_EQ(preferences.get("DatabaseCorruptionCount"), three);
   }
 
@@ -117,38 +112,25 @@ TEST_F(ProbesTest, TakeTheCorruptionCount) {
 
 TEST_F(ProbesTest, CountMinutesOfUptime) {
   constexpr const char* kUptime = "com.norvane.usage.cur_boot_session_cpu_uptime";
-  const struct {
-    std::uint64_t ticks;
-    std::optional<Clock::TimeBase> base;
-    std::int64_t minutes;
-  } kCases[] = {
-      {0, {{1, 1}}, 0},
-      {59'999'999'999, {{1, 1}}, 0},
-      {7'260'000'000'000, {{1, 1}}, 121},
-      {24'000'000ULL * 600, {{125, 3}}, 10},
-      {std::numeric_limits<std::uint64_t>::max(),
-       {{4294967295, 1}},
-       static_cast<std::int64_t>(4294967295 * 1e-9 / 1 / 60 * 18446744073709551616.0)},
-      {1, {{1, 0}}, -1},
-      {1, std::nullopt, -1},
-  };
-  for (const auto& c : kCases) {
-    fake.clock.tickCount = c.ticks;
-    fake.clock.base = c.base;
+  using Case = std::tuple<std::uint64_t, std::optional<Clock::TimeBase>, std::int64_t>;
+  for (const auto& [ticks, base, minutes] :
+       {Case(0, {{1, 1}}, 0), Case(59'999'999'999, {{1, 1}}, 0),
+        Case(7'260'000'000'000, {{1, 1}}, 121), Case(24'000'000ULL * 600, {{125, 3}}, 10),
+        Case(std::numeric_limits<std::uint64_t>::max(), {{4294967295, 1}},
+             static_cast<std::int64_t>(4294967295 * 1e-9 / 1 / 60 * 18446744073709551616.0)),
+        Case(1, {{1, 0}}, -1), Case(1, std::nullopt, -1)}) {
+    fake.clock.tickCount = ticks;
+    fake.clock.base = base;
     fake.log.entries.clear();
-    EXPECT_EQ(probe(kUptime), plist::Value(c.minutes)) << c.ticks;
+    EXPECT_EQ(probe(kUptime), plist::Value(minutes)) << ticks;
     EXPECT_EQ(fake.log.messages(LogLevel::Error),
-              c.minutes < 0 ? Messages{"Couldn't retrieve mach_timebase_info"} : Messages{});
+              minutes < 0 ? Messages{"Couldn't retrieve mach_timebase_info"} : Messages{});
   }
 }
 
 TEST_F(ProbesTest, ReadSystemControls) {
-  const struct {
-    const char *key, *control;
-    std::size_t length;
-    std::int64_t ones;  // what all-ones bytes are reported as
-    std::int64_t failure;
-  } kCases[] = {
+  // `ones` is what all-ones bytes are reported as.
+  const std::tuple<const char*, const char*, std::size_t, std::int64_t, std::int64_t> kCases[] = {
       {"com.norvane.kernel.memorystatus_freeze_count", "kern.memorystatus_freeze_count", 4,
        4294967295, 4294967295},
       {"com.norvane.kernel.memorystatus_freeze_pageouts", "kern.memorystatus_freeze_pageouts", 8,
@@ -157,18 +139,17 @@ TEST_F(ProbesTest, ReadSystemControls) {
        "kern.memorystatus_freeze_budget_pages_remaining", 8, -1, -1},
       {"com.norvane.kernel.memorystatus_thaw_count", "kern.memorystatus_thaw_count", 4, 4294967295,
        4294967295},
-      {"com.norvane.kernel.swapusage", "vm.swapusage", 32, -1, -1},
-  };
-  for (const auto& c : kCases) {
-    EXPECT_EQ(probe(c.key), plist::Value(c.failure)) << c.key;
-    auto& value = fake.controls.values[c.control];
-    value.assign(c.length, std::byte{0xFF});
-    EXPECT_EQ(probe(c.key), plist::Value(c.ones)) << c.key;
-    value.assign(c.length, std::byte{0});
+      {"com.norvane.kernel.swapusage", "vm.swapusage", 32, -1, -1}};
+  for (const auto& [key, control, length, ones, failure] : kCases) {
+    EXPECT_EQ(probe(key), plist::Value(failure)) << key;
+    auto& value = fake.controls.values[control];
+    value.assign(length, std::byte{0xFF});
+    EXPECT_EQ(probe(key), plist::Value(ones)) << key;
+    value.assign(length, std::byte{0});
     value[1] = std::byte{2};
-    EXPECT_EQ(probe(c.key), plist::Value(512)) << c.key;
+    EXPECT_EQ(probe(key), plist::Value(512)) << key;
     value.push_back(std::byte{0});  // longer than the buffer
-    EXPECT_EQ(probe(c.key), plist::Value(c.failure)) << c.key;
+    EXPECT_EQ(probe(key), plist::Value(failure)) << key;
   }
 }
 

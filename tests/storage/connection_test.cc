@@ -43,72 +43,35 @@ TEST(ConnectionTest, FetchesStatistics) {
   const Dictionary good = driver(answering(buffer));
   const Dictionary nvme = driver(answering(statistics({{4, {99}}}), 9), kNVMe);
   const Dictionary refusing = with(good, "OpenError", kKernelError);
-  const struct {
-    Array services;
-    bool result;
-    std::string error;
-    std::uint64_t hostWrites = 0;
-  } kCases[] = {
-      {{}, false, "Could not get matching Kernkit service for exporting classes\n"},
-      {{good}, true, "", 77},
-      {{nvme, good}, true, "", 77},
-      {{nvme}, true, "", 99},
-      {{refusing, nvme}, false, "Could not get connection to service\n"},
-      {{with(good, "CloseError", kKernelError)}, true, kCloseFailed, 77},
-      {{driver({with(failing, "Method", 8)})}, false, "IOConnectCallStructMethod: -536870212"},
-      {{with(sized(little32(~0U), whole), "CloseError", 1)},
-       false,
-       std::string("Could not valloc 4294967295 bytes") + kCloseFailed},
-      {{sized(little32(0), {{"Output", Data(Bytes())}})}, false, ""},
-      {{sized(little32(3), {{"Output", Data(Bytes(3))}})}, false, ""},
-      {{sized(size, failing)}, false, "Could not retrieve data from driver for selector d\n"},
-      // The answer may be shorter than was said; what is left out is not read.
-      {{sized(little32(4096), whole)}, true, "", 77},
-      {{sized(size, with(whole, "OutputLength", 16))}, true, "", 0},
-      {{sized(size, with(whole, "OutputLength", 24))}, false, "", 0},
-  };
-  for (const auto& c : kCases) {
-    StoragePlatform platform(c.services);
+  const auto fetch = [](const Array& services, bool result, const std::string& error,
+                        std::uint64_t hostWrites = 0) {
+    StoragePlatform platform(services);
     const NandExporter* exporter = nullptr;
     ASPContext context;
-    EXPECT_EQ(fetchStatistics(platform.drivers, platform.streams, exporter, context), c.result)
-        << c.error;
-    EXPECT_EQ(platform.streams.error, c.error);
+    EXPECT_EQ(fetchStatistics(platform.drivers, platform.streams, exporter, context), result)
+        << error;
+    EXPECT_EQ(platform.streams.error, error);
     EXPECT_EQ(platform.streams.output, "");
-    EXPECT_EQ(context.hostWrites, c.hostWrites) << c.error;
-    EXPECT_EQ(exporter->release == nullptr, c.services.empty());
-    EXPECT_EQ(exporter->className, c.services.empty()   ? ""
-                                   : c.hostWrites == 99 ? kNVMe
-                                                        : "ASPStorage");
-  }
-}
-
-TEST(ConnectionTest, AsksDriversInTheWayOfTheirRow) {
-  // Whoever sends a request with its query is refused.
-  const Bytes buffer = statistics({{4, {5}}});
-  Array methods;
-  for (const int flags : {0, 1})
-    methods.append(Dictionary{{"Method", 3}, {"Flags", flags}, {"Error", kKernelError}});
-  methods.append(Dictionary{{"Method", 3}, {"Output", Data(little32(16))}});
-  methods.append(Dictionary{{"Method", 4}, {"Output", Data(buffer)}});
-  StoragePlatform platform({driver(methods)});
-  const auto fetch = [&](SelectorGetter getter, std::uint32_t dataSelector) {
-    NandExporter row{.className = "ASPStorage",
-                     .sizeSelector = 3,
-                     .dataSelector = dataSelector,
-                     .statistics = getter,
-                     .parse = nand_exporters[0].parse};
-    ASPContext context;
-    return fetchStatisticsFrom(*platform.drivers.firstService("ASPStorage"), row, platform.streams,
-                               context);
+    EXPECT_EQ(context.hostWrites, hostWrites) << error;
+    EXPECT_EQ(exporter->release == nullptr, services.empty());
+    EXPECT_EQ(exporter->className, services.empty() ? "" : hostWrites == 99 ? kNVMe : "ASPStorage");
   };
-  static constexpr SelectorTable kNone{0xFFFFFFFF, 1};
-  EXPECT_FALSE(fetch([]() -> const SelectorTable* { return nullptr; }, 4));
-  EXPECT_FALSE(fetch([]() -> const SelectorTable* { return &kNone; }, 4));
-  EXPECT_TRUE(fetch(nullptr, 4));
-  EXPECT_EQ(platform.streams.error, "");
-  EXPECT_FALSE(fetch(nullptr, 5));
-  EXPECT_EQ(platform.streams.error, "Could not retrieve data from driver for selector 0\n");
+  fetch({}, false, "Could not get matching Kernkit service for exporting classes\n");
+  fetch({good}, true, "", 77);
+  fetch({nvme, good}, true, "", 77);
+  fetch({nvme}, true, "", 99);
+  fetch({refusing, nvme}, false, "Could not get connection to service\n");
+  fetch({with(good, "CloseError", kKernelError)}, true, kCloseFailed, 77);
+  fetch({driver({with(failing, "Method", 8)})}, false, "IOConnectCallStructMethod: -536870212");
+  fetch({with(sized(little32(~0U), whole), "CloseError", 1)}, false,
+        std::string("Could not valloc 4294967295 bytes") + kCloseFailed);
+  fetch({sized(little32(0), {{"Output", Data(Bytes())}})}, false, "");
+  fetch({sized(little32(3), {{"Output", Data(Bytes(3))}})}, false, "");
+  fetch({sized(size, failing)}, false, "Could not retrieve data from driver for selector d\n");
+  // The answer may be shorter than was said; what is left out is not read.
+  fetch({sized(little32(4096), whole)}, true, "", 77);
+  fetch({sized(size, with(whole, "OutputLength", 16))}, true, "", 0);
+  fetch({sized(size, with(whole, "OutputLength", 24))}, false, "", 0);
 }
 
 TEST(ConnectionTest, EncodesRequests) {
@@ -128,29 +91,22 @@ TEST(ConnectionTest, EncodesRequests) {
 TEST(ConnectionTest, OpensConnections) {
   const std::string noService = "Can't get ASP Connection, no matching service!\n";
   const Dictionary good = driver({});
-  const struct {
-    Array services;
-    bool opens;
-    std::string error;
-  } kCases[] = {
-      {{}, false, noService},
-      {{good}, true, ""},
-      {{with(good, "OpenError", kKernelError)},
-       false,
-       "IOServiceOpen failed for class 'ASPStorage', result 0xe00002bc\n"
-       "Can't get ASP Connection!\n"},
-  };
-  for (const auto& c : kCases) {
-    StoragePlatform platform(c.services);
+  using Case = std::tuple<Array, bool, std::string>;
+  const Case kCases[] = {Case({}, false, noService), Case({good}, true, ""),
+                         Case({with(good, "OpenError", kKernelError)}, false,
+                              "IOServiceOpen failed for class 'ASPStorage', result 0xe00002bc\n"
+                              "Can't get ASP Connection!\n")};
+  for (const auto& [services, opens, error] : kCases) {
+    StoragePlatform platform(services);
     ASPConnection connection;
     closeASPConnection(connection);
-    EXPECT_EQ(openASPConnection(platform.drivers, platform.streams, connection), c.opens);
-    EXPECT_EQ(connection.service != nullptr, c.opens);
+    EXPECT_EQ(openASPConnection(platform.drivers, platform.streams, connection), opens);
+    EXPECT_EQ(connection.service != nullptr, opens);
     for (int i = 0; i < 2; ++i) {
       closeASPConnection(connection);
       EXPECT_TRUE(!connection.service && !connection.connection);
     }
-    EXPECT_EQ(platform.streams.error, c.error);
+    EXPECT_EQ(platform.streams.error, error);
   }
 
   StoragePlatform none({}), stuck({with(good, "CloseError", kKernelError)});
@@ -164,11 +120,7 @@ TEST(ConnectionTest, OpensConnections) {
 TEST(ConnectionTest, AsksForContentDeletion) {
   const auto answer = [](const Dictionary& row) { return driver({with(row, "Method", 5)}); };
   const Dictionary yes = answer({{"Output", Data(little32(0x01000000))}});
-  const struct {
-    Array services;
-    bool recommends;
-    std::string error;
-  } kCases[] = {
+  const std::tuple<Array, bool, std::string> kCases[] = {
       {{yes}, true, ""},
       {{answer({{"Output", Data(little32(0))}})}, false, ""},
       {{answer({{"Output", Data(little32(1))}, {"OutputLength", 3}})}, false, ""},
@@ -176,12 +128,11 @@ TEST(ConnectionTest, AsksForContentDeletion) {
       {{with(driver({}, kNVMe), "OpenError", kKernelError)}, false, ""},
       {{}, false, "_load_nand_infoCould not get matching Kernkit service for exporting classes\n"},
       {{with(yes, "OpenError", 1)}, false, "Could not get connection to service\n"},
-      {{with(answer({{"Output", Data(little32(2))}}), "CloseError", 1)}, true, kCloseFailed},
-  };
-  for (const auto& c : kCases) {
-    StoragePlatform platform(c.services);
-    EXPECT_EQ(NandRecommendsContentDeletion(platform.drivers, platform.streams), c.recommends);
-    EXPECT_EQ(platform.streams.error, c.error);
+      {{with(answer({{"Output", Data(little32(2))}}), "CloseError", 1)}, true, kCloseFailed}};
+  for (const auto& [services, recommends, error] : kCases) {
+    StoragePlatform platform(services);
+    EXPECT_EQ(NandRecommendsContentDeletion(platform.drivers, platform.streams), recommends);
+    EXPECT_EQ(platform.streams.error, error);
   }
 }
 

@@ -33,11 +33,7 @@ std::string described(const TelemetryCounters& counters) {
 }
 
 TEST(CountersTest, CopiesByMap) {
-  const struct {
-    CounterParser parser;
-    const char* name;
-    std::string_view words;
-  } kCases[] = {
+  const std::tuple<CounterParser, const char*, std::string_view> kCases[] = {
       // clang-format off
       {parseOnlyAlgoGenericCounters, "parseOnlyAlgoGenericCounters",
        "readStage 0-18 37 117-118 91 *10\n"
@@ -88,66 +84,49 @@ TEST(CountersTest, CopiesByMap) {
   const CounterBlock block(bytes.data(), kCounterBlockBytes);
   TelemetryCounters counters;
   counters.elements.fill(0xFFFFFFFF);
-  for (const auto& c : kCases) {
-    c.parser(block, counters);
-    EXPECT_EQ(described(counters), c.words);
-    EXPECT_EQ(counterParserName(c.parser), c.name);
+  for (const auto& [parser, name, words] : kCases) {
+    parser(block, counters);
+    EXPECT_EQ(described(counters), words);
+    EXPECT_EQ(counterParserName(parser), name);
   }
   parseCountersAlgoGeneric(block, counters);
-  EXPECT_EQ(described(counters), kCases[0].words);
+  EXPECT_EQ(described(counters), std::get<2>(kCases[0]));
   parseCountersAlgoGenericK4(block, counters);
-  EXPECT_EQ(described(counters), kCases[1].words);
+  EXPECT_EQ(described(counters), std::get<2>(kCases[1]));
 }
 
 TEST(CountersTest, SelectsParsers) {
-  const struct {
-    const char* chip;
-    const char* manufacturer;
-    const char* parser;
-  } kCases[] = {
-      {"K3V", "4582603A5700", "parseCountersAlgoGeneric"},
-      {"K4V", "AD825223215F", "parseCountersAlgoGenericK4"},
-      {"K2V", "AD825223215F", "parseCounters1xHynix"},
-      {"K3", "ad82522321FF99", "parseCounters1xHynix"},
-      {"", "4582603A5700", "parseCounters1xSandisk"},
-      {"K3V1", "458260DE57EE", "parseCounters1xSandisk"},
-      {"", "4582603B5700", "parseCounters1y"},
-      {"", "AD82", "parseCounters1y"},
-      {"", "AD", "parseCounters1y"},
-      {"", "AD82522321", "parseCounters1y"},
-  };
+  using Case = std::tuple<const char*, const char*, const char*>;
   FakeStreams streams;
-  for (const auto& c : kCases) {
-    const auto id = readManufacturerId(streams, c.manufacturer);
-    EXPECT_EQ(counterParserName(selectCounterParser(chipGeneration(c.chip), id.vendor, id.device)),
-              c.parser)
-        << c.chip << " " << c.manufacturer;
+  for (const auto& [chip, manufacturer, parser] :
+       {Case("K3V", "4582603A5700", "parseCountersAlgoGeneric"),
+        Case("K4V", "AD825223215F", "parseCountersAlgoGenericK4"),
+        Case("K2V", "AD825223215F", "parseCounters1xHynix"),
+        Case("K3", "ad82522321FF99", "parseCounters1xHynix"),
+        Case("", "4582603A5700", "parseCounters1xSandisk"),
+        Case("K3V1", "458260DE57EE", "parseCounters1xSandisk"),
+        Case("", "4582603B5700", "parseCounters1y"), Case("", "AD82", "parseCounters1y"),
+        Case("", "AD", "parseCounters1y"), Case("", "AD82522321", "parseCounters1y")}) {
+    const auto id = readManufacturerId(streams, manufacturer);
+    EXPECT_EQ(counterParserName(selectCounterParser(chipGeneration(chip), id.vendor, id.device)),
+              parser)
+        << chip << " " << manufacturer;
   }
   EXPECT_EQ(streams.output, "");
 }
 
 TEST(CountersTest, ReadsHexadecimal) {
-  const struct {
-    std::string_view text;
-    std::uint32_t number;
-    std::string output;
-  } kCases[] = {
-      {"", 0, ""},
-      {"7", 7, ""},
-      {"12345678", 0x12345678, ""},
-      {"123456789", 0x12345678, ""},
-      {"AD82", 0xAD82, ""},
-      {"abc", 0xAB0C, ""},
-      {"1G", 0x10, "unrecognized hex character: g"},
-      {"@G", 0, "unrecognized hex character: @unrecognized hex character: g"},
-      {{"\xC4\0F", 3},
-       0x0F,
-       {"unrecognized hex character: \xC4unrecognized hex character: \0", 58}},
-  };
-  for (const auto& c : kCases) {
+  using Case = std::tuple<std::string_view, std::uint32_t, std::string>;
+  for (const auto& [text, number, output] :
+       {Case("", 0, ""), Case("7", 7, ""), Case("12345678", 0x12345678, ""),
+        Case("123456789", 0x12345678, ""), Case("AD82", 0xAD82, ""), Case("abc", 0xAB0C, ""),
+        Case("1G", 0x10, "unrecognized hex character: g"),
+        Case("@G", 0, "unrecognized hex character: @unrecognized hex character: g"),
+        Case({"\xC4\0F", 3}, 0x0F,
+             {"unrecognized hex character: \xC4unrecognized hex character: \0", 58})}) {
     FakeStreams streams;
-    EXPECT_EQ(hexStringToInt32(streams, c.text), c.number) << c.text;
-    EXPECT_EQ(streams.output, c.output);
+    EXPECT_EQ(hexStringToInt32(streams, text), number) << text;
+    EXPECT_EQ(streams.output, output);
     EXPECT_EQ(streams.error, "");
   }
   FakeStreams streams;

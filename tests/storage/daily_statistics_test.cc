@@ -23,24 +23,20 @@ Scalars scalarsOf(const StoragePlatform& platform) {
 }
 
 TEST(DailyStatisticsTest, ReportsDiskUsageInMebibytes) {
-  const struct {
-    Value answer;
-    std::int64_t capacity, available;
-  } kCases[] = {
+  const std::tuple<Value, std::int64_t, std::int64_t> kCases[] = {
       {{}, -1, -1},
       {"text", -1, -1},
       {Dictionary{{"TotalDiskCapacity", 1048575}, {"TotalDataAvailable", 1048576}}, 0, 1},
       {Dictionary{{"TotalDiskCapacity", INT64_MAX}, {"TotalDataAvailable", "1"}}, INT64_MAX >> 20,
        -1},
-      {Dictionary{{"TotalDataAvailable", -1}}, -1, -1},
-  };
-  for (const auto& c : kCases) {
+      {Dictionary{{"TotalDataAvailable", -1}}, -1, -1}};
+  for (const auto& [answer, capacity, available] : kCases) {
     StoragePlatform platform(Array{});
-    platform.answers.answers.set("DiskUsage", c.answer);
+    platform.answers.answers.set("DiskUsage", answer);
     dailyStorageStatistics(platform.platform);
     EXPECT_EQ(scalarsOf(platform),
-              (Scalars{{"com.norvane.lumenhall.DiskUsageUserTotalBlocks", c.capacity},
-                       {"com.norvane.lumenhall.DiskUsageUserBlocksFree", c.available}}));
+              (Scalars{{"com.norvane.lumenhall.DiskUsageUserTotalBlocks", capacity},
+                       {"com.norvane.lumenhall.DiskUsageUserBlocksFree", available}}));
     EXPECT_EQ(platform.log.messages(),
               (std::vector<std::string>{
                   "error reading nand info, error 1 with message Unable to parse buffer"}));
@@ -76,28 +72,24 @@ TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
         "error reading nand info, error 1 with message Unable to parse buffer",
         format("Unexpected errno (%d) reading ECC events from kernel", number)};
   };
-  const struct {
-    std::size_t pending;
-    int errorBehind;
-    std::size_t logged, left;
-    std::vector<std::string> messages;
-  } kCases[] = {{0, 2, 0, 0, {unexpected(0)[0]}},
-                {3, 16, 3, 0, {unexpected(0)[0]}},
-                {1, 5, 1, 0, unexpected(5)},
-                {10, 2, 10, 0, {unexpected(0)[0]}},
-                {12, 2, 10, 1, unexpected(0)}};
-  for (const auto& c : kCases) {
+  const std::tuple<std::size_t, int, std::size_t, std::size_t, std::vector<std::string>> kCases[] =
+      {{0, 2, 0, 0, {unexpected(0)[0]}},
+       {3, 16, 3, 0, {unexpected(0)[0]}},
+       {1, 5, 1, 0, unexpected(5)},
+       {10, 2, 10, 0, {unexpected(0)[0]}},
+       {12, 2, 10, 1, unexpected(0)}};
+  for (const auto& [pending, errorBehind, logged, left, messages] : kCases) {
     StoragePlatform platform(Array{});
-    for (std::size_t i = 0; i < c.pending; ++i)
+    for (std::size_t i = 0; i < pending; ++i)
       platform.controls.eccEvents.push_back(
           event(static_cast<std::uint8_t>(i), static_cast<std::uint8_t>(i == 2 ? 200 : i)));
-    platform.controls.errorBehindEvents = c.errorBehind;
+    platform.controls.errorBehindEvents = errorBehind;
     dailyStorageStatistics(platform.platform);
     const auto& records = platform.crashReporting.records;
-    ASSERT_EQ(records.size(), c.logged);
-    EXPECT_EQ(platform.controls.eccEvents.size(), c.left);
-    EXPECT_EQ(platform.log.messages(), c.messages);
-    if (c.logged < 3) continue;
+    ASSERT_EQ(records.size(), logged);
+    EXPECT_EQ(platform.controls.eccEvents.size(), left);
+    EXPECT_EQ(platform.log.messages(), messages);
+    if (logged < 3) continue;
     EXPECT_EQ(records[0].first, 172U);
     EXPECT_EQ(records[0].second, (Dictionary{{"id", 0}, {"count", 0}}));
     EXPECT_EQ(records[1].second, (Dictionary{{"id", 1}, {"count", 1}, {"reg0", -1}}));

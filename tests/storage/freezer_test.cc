@@ -32,28 +32,23 @@ std::string items(const std::string& words) {
     std::string counters(40, '\x7f');
     storeLittle64(std::as_writable_bytes(std::span(counters)), 24, number);
     std::replace(rest.begin(), rest.end(), '*', '\0');
-    const std::map<char, std::string> kinds{
-        {'(', item(0x13, number, "kind")},
-        {')', item(0x14, number, "")},
-        {'n', item(0x909, 0, rest)},
-        {'s', item(0x901, 0, counters)},
-        {'-', item(0x901, 0, counters.substr(0, 31))},
-        {'a', item(0x2F, 1, item(0x13, 9, "kind"))},
-        {'?', item(0x909, 0, "VM", 0xFFFFFFF0)},
-        {'.', item(0xF19158ED, 0, "")},
-        {'x', item(0x13, 9, "kin")},
-    };
+    const std::map<char, std::string> kinds{{'(', item(0x13, number, "kind")},
+                                            {')', item(0x14, number, "")},
+                                            {'n', item(0x909, 0, rest)},
+                                            {'s', item(0x901, 0, counters)},
+                                            {'-', item(0x901, 0, counters.substr(0, 31))},
+                                            {'a', item(0x2F, 1, item(0x13, 9, "kind"))},
+                                            {'?', item(0x909, 0, "VM", 0xFFFFFFF0)},
+                                            {'.', item(0xF19158ED, 0, "")},
+                                            {'x', item(0x13, 9, "kin")}};
     out += kinds.at(word[0]);
   }
   return out;
 }
 
 TEST(VMFreezer, FindsTheThreadsWrites) {
-  struct Case {
-    const char* items;
-    const char* writes;  // empty: an error
-  };
-  static constexpr Case kCases[] = {
+  // What was written, empty for an error.
+  static constexpr std::pair<const char*, std::string_view> kCases[] = {
       {"(1 (2 nVM_swapout s123456 )2 )1", "123456"},
       {"(1 nVM_swapout s18446744073709551615 )1", "18446744073709551615"},
       {"(1 s5 (2 nVM_swapout )2 )1", "0"},  // its own figures only
@@ -73,22 +68,21 @@ TEST(VMFreezer, FindsTheThreadsWrites) {
       {"(1 nVM_swapout (2 nother ? )2 )1", "0"},  // ends every level
       {"(1 (2 nother . nVM_swapout s6 )1", "6"},  // ends one level
       {". (1 nVM_swapout )1", ""},
-      {"", ""},
-  };
+      {"", ""}};
   fakes::FakeSnapshots snapshots;
   const auto copied = [&] { return textOf(CopyVMFreezerNANDInfo(snapshots)); };
   const std::string error =
       "{\"com.norvane.NANDInfo.VMFreezer.Error\": \"1\", "
       "\"com.norvane.NANDInfo.VMFreezer.ErrorMessage\": "
       "\"Unable parse snapshot for VMFreezer NAND writes.\"}";
-  for (const Case& row : kCases) {
-    const std::string content = items(row.items);
+  for (const auto& [described, writes] : kCases) {
+    const std::string content = items(described);
     snapshots.content.assign(asBytes(content).begin(), asBytes(content).end());
-    EXPECT_EQ(copied(), *row.writes == '\0'
-                            ? error
-                            : format("{\"com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites\": %s}",
-                                     row.writes))
-        << row.items;
+    EXPECT_EQ(copied(),
+              writes.empty()
+                  ? error
+                  : format("{\"com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites\": %s}", writes))
+        << described;
     EXPECT_EQ(snapshots.flags, 0x10000U);
   }
   for (bool* step :

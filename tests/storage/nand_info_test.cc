@@ -62,11 +62,7 @@ TEST(NandInfoTest, SetsFixedFiguresInTheirOrder) {
 
 TEST(NandInfoTest, ReadsStatistics) {
   const std::uint64_t kEpoch = 946684800;
-  const struct {
-    std::vector<Record> records;
-    const char* suffix;
-    std::optional<std::int64_t> value;
-  } kCases[] = {
+  const std::tuple<std::vector<Record>, const char*, std::optional<std::int64_t>> kCases[] = {
       {{{56, {kEpoch}}}, "formatDaysSince2000", 0},
       {{{56, {kEpoch + 604799}}}, "formatDaysSince2000", 0},
       {{{56, {1}}}, "formatDaysSince2000", 0},
@@ -87,13 +83,12 @@ TEST(NandInfoTest, ReadsStatistics) {
       {{{143, {12345}}}, "memChokeDuration", 12345},
       {{{121, {1, 2, 3, 4}}}, "PadSize1", 1},
       {{{114, {1, 2, 3, 4, 5}}}, "BandsPerInternalFlow3", 5},
-      {{{77, {1}}, {77, {2}}}, "StaticDataSizeInMB", 2},
-  };
-  for (const auto& c : kCases) {
-    auto records = c.records;
+      {{{77, {1}}, {77, {2}}}, "StaticDataSizeInMB", 2}};
+  for (const auto& [own, suffix, value] : kCases) {
+    auto records = own;
     records.push_back({53, {0x20002}});
-    const auto value = infoOf(records).number(std::string(kNANDInfoKeyPrefix) + c.suffix);
-    EXPECT_EQ(value ? std::optional(value->int64()) : std::nullopt, c.value) << c.suffix;
+    const auto found = infoOf(records).number(std::string(kNANDInfoKeyPrefix) + suffix);
+    EXPECT_EQ(found ? std::optional(found->int64()) : std::nullopt, value) << suffix;
   }
 }
 
@@ -109,9 +104,6 @@ TEST(NandInfoTest, RoundsMaximumDurations) {
 }
 
 TEST(NandInfoTest, MapsAllKeys) {
-  EXPECT_EQ(keyMap.size(), 304U);
-  EXPECT_EQ(keyMap.front().name, "staticSizeInMB");
-  EXPECT_EQ(keyMap.back().name, "raidFailedReadQParity");
   std::string rows;
   for (const KeyMapRow& row : keyMap) {
     appendFormat(rows, "%s %s\n", row.name, row.suffix);
@@ -138,14 +130,12 @@ TEST(NandInfoTest, TellsErrors) {
                       {"com.norvane.NANDInfo.ErrorMessage", message}};
   };
   const Dictionary before{{"com.norvane.NANDInfo.NodesFree", "x"}, {"other", 1}};
-  const struct {
-    std::vector<Record> records;
-    Dictionary info;
-  } kCases[] = {{{{4, {1}}}, error("Unsupported export version")},
-                {{{53, {0x20003}}, {0x30000001, {}}}, error("Unable to parse buffer")}};
-  for (const auto& c : kCases) {
-    StoragePlatform platform({driver(answering(statistics(c.records)))});
-    EXPECT_EQ(plist::Value(CopyNANDInfo(platform.platform)), c.info);
+  const std::pair<std::vector<Record>, Dictionary> kCases[] = {
+      {{{4, {1}}}, error("Unsupported export version")},
+      {{{53, {0x20003}}, {0x30000001, {}}}, error("Unable to parse buffer")}};
+  for (const auto& [records, info] : kCases) {
+    StoragePlatform platform({driver(answering(statistics(records)))});
+    EXPECT_EQ(plist::Value(CopyNANDInfo(platform.platform)), info);
     auto target = plist::mutableCopy(before);
     DumpNANDInfo(platform.platform, target);
     EXPECT_EQ(plist::Value(target), before);

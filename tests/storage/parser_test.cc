@@ -25,46 +25,34 @@ std::vector<std::string> listed(const ASPContext& context) {
 
 TEST(ParserTest, ParsesRecords) {
   const std::vector<Record> twice{{53, {6}}, {53, {7}}};
-  const struct {
-    std::vector<Record> records;
-    std::size_t cut;  // bytes off the end; 7 bytes of no whole unit follow what is left
-    int result;
-    std::uint32_t exportVersion;  // 5 before the parse
-    std::vector<std::string> entries;
-  } kCases[] = {
-      {{}, 0, 0, 5, {}},
-      {{{53, {4295098371}}}, 0, 1, 0x20003, {"exportVersion=4295098371"}},
-      {{{0x30000000, {}}}, 0, 1, 5, {}},
-      {{{4, {7}}, {0x30000001, {}}}, 0, 0, 0, {"hostWrites=7"}},
-      {{{0, {1}}, {21, {1, 2, 3}}, {396, {9}}, {395, {5}}},
-       0,
-       1,
-       5,
-       {"raidFailedRMXReconstructionHost=5"}},
-      {{{184, {}}, {54, {}}}, 0, 1, 5, {}},
-      {{{54, {8}}}, 0, 1, 5, {"ECBins=8"}},
-      {{{185, {8, 9}}, {124, {1, 2, 3}}},
-       0,
-       1,
-       5,
-       {"TempSensorMin=8", "coldestCycle0=1", "coldestCycle1=2"}},
-      {{{265, {1, 2}}}, 0, 1, 5, {"readCountHisto0=1", "readCountHisto1=2"}},
-      {{{4, {1}}, {4, {~0ULL}}}, 0, 1, 5, {"hostWrites=1", "hostWrites=18446744073709551615"}},
-      {twice, 0, 1, 7, {"exportVersion=6", "exportVersion=7"}},
-      {twice, 8, 0, 0, {"exportVersion=6"}},
-      {twice, 16, 1, 6, {"exportVersion=6"}},
-      {twice, 24, 0, 0, {}},
-      {{{53, {6}}, {21, {1, 2}}}, 8, 0, 0, {"exportVersion=6"}},
-  };
-  for (const auto& c : kCases) {
-    Bytes bytes = statistics(c.records);
-    bytes.resize(bytes.size() - c.cut);
+  // `cut` bytes are taken off the end, and 7 of no whole unit follow what is left; `exportVersion`
+  // is 5 before the parse.
+  using Case =
+      std::tuple<std::vector<Record>, std::size_t, int, std::uint32_t, std::vector<std::string>>;
+  for (const auto& [records, cut, result, exportVersion, entries] :
+       {Case({}, 0, 0, 5, {}),
+        Case({{53, {4295098371}}}, 0, 1, 0x20003, {"exportVersion=4295098371"}),
+        Case({{0x30000000, {}}}, 0, 1, 5, {}),
+        Case({{4, {7}}, {0x30000001, {}}}, 0, 0, 0, {"hostWrites=7"}),
+        Case({{0, {1}}, {21, {1, 2, 3}}, {396, {9}}, {395, {5}}}, 0, 1, 5,
+             {"raidFailedRMXReconstructionHost=5"}),
+        Case({{184, {}}, {54, {}}}, 0, 1, 5, {}), Case({{54, {8}}}, 0, 1, 5, {"ECBins=8"}),
+        Case({{185, {8, 9}}, {124, {1, 2, 3}}}, 0, 1, 5,
+             {"TempSensorMin=8", "coldestCycle0=1", "coldestCycle1=2"}),
+        Case({{265, {1, 2}}}, 0, 1, 5, {"readCountHisto0=1", "readCountHisto1=2"}),
+        Case({{4, {1}}, {4, {~0ULL}}}, 0, 1, 5,
+             {"hostWrites=1", "hostWrites=18446744073709551615"}),
+        Case(twice, 0, 1, 7, {"exportVersion=6", "exportVersion=7"}),
+        Case(twice, 8, 0, 0, {"exportVersion=6"}), Case(twice, 16, 1, 6, {"exportVersion=6"}),
+        Case(twice, 24, 0, 0, {}), Case({{53, {6}}, {21, {1, 2}}}, 8, 0, 0, {"exportVersion=6"})}) {
+    Bytes bytes = statistics(records);
+    bytes.resize(bytes.size() - cut);
     bytes.resize(bytes.size() + 7, std::byte{0xFF});
     ASPContext context;
     context.exportVersion = 5;
-    EXPECT_EQ(ASPParseBufferToCxt(context, bytes), c.result);
-    EXPECT_EQ(context.exportVersion, c.exportVersion);
-    EXPECT_EQ(listed(context), c.entries);
+    EXPECT_EQ(ASPParseBufferToCxt(context, bytes), result);
+    EXPECT_EQ(context.exportVersion, exportVersion);
+    EXPECT_EQ(listed(context), entries);
     EXPECT_EQ(context.driverVersion, 0xFFFFFFFF);
   }
   // Counts that wrap when they are turned into bytes.

@@ -101,22 +101,17 @@ TEST(Snapshot, CutsWhatDoesNotFit) {
 
 TEST(Snapshot, PrintsFieldsByKindAndLeavesUnusedRecordsOut) {
   const std::string records = words({9, 123999, kMost, 4, 5, 6, 7, 0, 1, 2, 3, 4, 5, 6});
-  struct Case {
-    std::vector<Field> fields;
-    const char* text;
-  };
-  const Case cases[] = {
+  const std::pair<std::vector<Field>, const char*> cases[] = {
       {{{0, 0, 0, "%u"}, {1, 8, 0, " %d"}}, "9 -1\n"},
       {{{1, 0, 0, ""}, {2, 0, 0, ""}, {3, 4, 12, ""}}, "1239994294967295    4\n"},
       {{{4, 0, 0, "%n"}, {9, kMost, kMost, "no zero byte, none"}, {1, 12, 0, "%x"}}, "4\n"},
       {{{2, 0, 0, "%u.%02u"}, {2, 8, 0, " %u.%02u"}}, "0.00 4294967.29\n"},
       {{{2, 0, 0, "%u"}, {1, 0, 0, "|"}, {0, 0, 0, "100%%"}}, "0|100%\n"},
       {{{3, 0, 35, "%s:"}}, "O:   9/   4L: 123999/      5M:4294967295/    6\n"},
-      {{{3, 0, 8, "%s "}, {0, 0, 0, "%c"}}, "O L M \t\n"},
-  };
-  for (const Case& row : cases) {
-    const std::string by = descriptor(6, 28, 2, row.fields, "%s%n ");
-    EXPECT_EQ(render(records, &by), std::string("%s%n ") + row.text);
+      {{{3, 0, 8, "%s "}, {0, 0, 0, "%c"}}, "O L M \t\n"}};
+  for (const auto& [fields, text] : cases) {
+    const std::string by = descriptor(6, 28, 2, fields, "%s%n ");
+    EXPECT_EQ(render(records, &by), std::string("%s%n ") + text);
   }
 }
 
@@ -153,8 +148,7 @@ TEST(Snapshot, RefusesDescriptorsThatBreakALimit) {
       {descriptor(5, 4, 1, one, "", 34),
        "the field table at byte 34 ends beyond the descriptor's 69 bytes"},
       {descriptor(6, 4, 1, one).substr(0, 32), "the key has no zero byte"},
-      {std::string(27, '\0'), "the descriptor ends within its header, at 27 bytes"},
-  };
+      {std::string(27, '\0'), "the descriptor ends within its header, at 27 bytes"}};
   const std::string records(24, 'r');
   for (const auto& [bytes, reason] : cases) {
     const auto layout = readSnapshotDescriptor(asBytes(bytes), records.size());

@@ -17,7 +17,7 @@ using plist::Data;
 using plist::Dictionary;
 using plist::Value;
 
-Bytes words(std::initializer_list<std::uint32_t> values) {
+Bytes words(const std::vector<std::uint32_t>& values) {
   Bytes out;
   for (const std::uint32_t value : values) {
     const Bytes word = little32(value);
@@ -64,36 +64,28 @@ const fakes::Bytes kStatisticsBuffer = fakes::statistics(
     {{49, {4096}}, {50, {1}}, {20, {5}}, {4, {2}}, {129, {3}}, {84, {9}}, {129, {1}}, {84, {1}}});
 
 TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
-  const Bytes list = [] {
-    Bytes bytes = words({5, 1, 0, 0, 0});
-    for (const auto& [bucket, value] : {std::pair(3U, -1), {16U, 8}, {0U, 7}, {3U, 4}, {15U, 1}}) {
-      const Bytes record = words({bucket, static_cast<std::uint32_t>(value), 0, 0, 0});
-      bytes.insert(bytes.end(), record.begin(), record.end());
-    }
-    return bytes;
-  }();
+  const Bytes list = words({5, 1, 0, 0, 0, 3, ~0U, 0, 0, 0, 16, 8, 0, 0, 0,
+                            0, 7, 0, 0, 0, 3, 4,   0, 0, 0, 15, 1, 0, 0, 0});
   const std::string kText =
       " tavrel[211]: IntermediateWamp:0.50;UserWamp:2.50;ValidityList[0]:7;ValidityList[3]:-1,4;"
       "ValidityList[15]:1\n";
-  const struct {
-    Value preference;
-    bool forced, logged;
-  } kCases[] = {{{}, false, true},   {3.0, false, false}, {2.5F, false, false}, {2.25, false, true},
-                {12.0, false, true}, {0.0, false, true},  {3, false, true},     {3.0, true, true}};
-  for (const auto& c : kCases) {
+  const std::tuple<Value, bool, bool> kCases[] = {
+      {{}, false, true},   {3.0, false, false}, {2.5F, false, false}, {2.25, false, true},
+      {12.0, false, true}, {0.0, false, true},  {3, false, true},     {3.0, true, true}};
+  for (const auto& [preference, forced, logged] : kCases) {
     Driver driver;
     driver.answer(kStatistics, kStatisticsBuffer);
     driver.answer(kBands, list);
     StoragePlatform platform({driver.service(1), Driver::parent(1)});
-    platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", c.preference);
-    gForceCollectionSet = c.forced;
+    platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", preference);
+    gForceCollectionSet = forced;
     DumpStorageStructuredLog(platform.platform, false);
     gForceCollectionSet = false;
-    EXPECT_EQ(gNeedValidityList, c.logged) << textOf(c.preference);
+    EXPECT_EQ(gNeedValidityList, logged) << textOf(preference);
     EXPECT_EQ(gCurrentUserWamp, 2.5);
     EXPECT_EQ(gCurrentSysWamp, 0.5);
-    ASSERT_EQ(platform.submission.logs.size(), c.logged ? 1U : 0U);
-    if (!c.logged) continue;
+    ASSERT_EQ(platform.submission.logs.size(), logged ? 1U : 0U);
+    if (!logged) continue;
     EXPECT_EQ(platform.submission.logs[0].type, "165");
     EXPECT_TRUE(platform.submission.logs[0].content.ends_with(kText))
         << platform.submission.logs[0].content;
@@ -190,97 +182,71 @@ TEST(StructuredLogTest, RefusesTelemetryThatItCannotPlace) {
     changed.set(key, value);
     return Value(changed);
   };
-  const std::string bounds = "ERROR: Attempting to parse beyond the bounds of the buffer\n";
-  const struct {
-    Value characteristics;
-    std::size_t size;
-    std::string error;
-    std::string output = {};
-  } kCases[] = {
-      {"text", 4128, "ERROR: Could not parse the Device Characteristics dictionary\n"},
-      {with("chip-id", {}), 4128, "ERROR: Could not determine the chip-id\n"},
-      {with("chip-id", 5), 4128, "ERROR: chip-id is not stored as a CFStringTypeID\n"},
-      {with("chip-id", std::string(64, 'K')), 4128,
-       "ERROR: Unable to obtain chip-id as conversion from the UniChar contents of CFString failed,"
-       " or the buffer of 64 bytes is too small\n"},
-      {with("manufacturer-id", {}), 4128, "ERROR: Could not determine the manufacturer-id\n"},
-      {with("manufacturer-id", true), 4128,
-       "ERROR: manufacturer-id is not stored as a CFStringTypeID\n"},
-      {with("num-bus", {}), 4128, "ERROR: could not determine the number of channels\n"},
-      {with("num-bus", "1"), 4128, "ERROR: could not determine the number of channels\n"},
-      {Dictionary{{"chip-id", ""}, {"manufacturer-id", "1G"}}, 0,
-       "ERROR: could not determine the number of channels\n", "unrecognized hex character: g"},
-      {good, 4127, bounds},
-      {with("num-bus", INT32_MAX), 4128, bounds},
-      {good, 4128, ""},
-      {with("chip-id", std::string(63, 'K')), 4128, ""},
-      {with("num-bus", -1), 0, ""},
-      {with("num-bus", 0), 0, ""},
-  };
-  for (const auto& c : kCases) {
+  const auto log = [](const Value& characteristics, std::size_t size, const std::string& error,
+                      const std::string& output = {}) {
     StoragePlatform platform(Array{});
-    EXPECT_EQ(logTelemetryList(platform.platform, Bytes(c.size), c.characteristics),
-              c.error.empty())
-        << c.error;
-    EXPECT_EQ(platform.streams.error, c.error);
-    EXPECT_EQ(platform.streams.output, c.output);
-    EXPECT_EQ(platform.crashReporting.records.size(), c.error.empty() && c.size != 0 ? 1U : 0U);
-  }
+    EXPECT_EQ(logTelemetryList(platform.platform, Bytes(size), characteristics), error.empty());
+    EXPECT_EQ(platform.streams.error, error.empty() ? "" : "ERROR: " + error + "\n");
+    EXPECT_EQ(platform.streams.output, output);
+    EXPECT_EQ(platform.crashReporting.records.size(), error.empty() && size != 0 ? 1U : 0U);
+  };
+  const std::string bounds = "Attempting to parse beyond the bounds of the buffer";
+  const std::string noChannels = "could not determine the number of channels";
+  log("text", 4128, "Could not parse the Device Characteristics dictionary");
+  log(with("chip-id", {}), 4128, "Could not determine the chip-id");
+  log(with("chip-id", 5), 4128, "chip-id is not stored as a CFStringTypeID");
+  log(with("chip-id", std::string(64, 'K')), 4128,
+      "Unable to obtain chip-id as conversion from the UniChar contents of CFString failed, or the "
+      "buffer of 64 bytes is too small");
+  log(with("manufacturer-id", {}), 4128, "Could not determine the manufacturer-id");
+  log(with("manufacturer-id", true), 4128, "manufacturer-id is not stored as a CFStringTypeID");
+  log(with("num-bus", {}), 4128, noChannels);
+  log(with("num-bus", "1"), 4128, noChannels);
+  log(Dictionary{{"chip-id", ""}, {"manufacturer-id", "1G"}}, 0, noChannels,
+      "unrecognized hex character: g");
+  log(good, 4127, bounds);
+  log(with("num-bus", INT32_MAX), 4128, bounds);
+  log(good, 4128, "");
+  log(with("chip-id", std::string(63, 'K')), 4128, "");
+  log(with("num-bus", -1), 0, "");
+  log(with("num-bus", 0), 0, "");
 }
 
 TEST(StructuredLogTest, FilesOneRecordPerChannel) {
   // Word n of channel c's block is 1000 c + n, field n of its record 100 c + n.
   constexpr std::uint32_t kChannels = 2;
-  Bytes list;
-  for (std::uint32_t word = 0; word < kChannels * 1024; ++word) {
-    const Bytes bytes = little32(1000 * (word / 1024) + word % 1024);
-    list.insert(list.end(), bytes.begin(), bytes.end());
-  }
-  for (std::uint32_t field = 0; field < kChannels * 8; ++field) {
-    const Bytes bytes = little32(100 * (field / 8) + field % 8);
-    list.insert(list.end(), bytes.begin(), bytes.end());
-  }
-  const struct {
-    const char* chip;
-    std::size_t entries;
-    std::vector<std::pair<const char*, int>> values;  // of the second channel
-  } kCases[] = {
-      {"K3V",
-       7 + 23 + 23 + 8 + 12 + 12 + 10 + 10 + 10 + 12 + 8,
-       {{"RD", 100},
-        {"num_pages", 106},
-        {"readStage[22]", 1091},
-        {"algoNANDAccessesBin[7]", 1113}}},
-      {"K4V",
-       7 + 33 + 23 + 8 + 38 + 12 + 10 + 10 + 10 + 12 + 12,
-       {{"block_type", 105},
-        {"readStage[32]", 1110},
-        {"dspExceptionParameter[37]", 1026},
-        {"retentionIndication[3]", 1076},
-        {"retentionIndication[11]", 0}}},
-      {"other",
-       7 + 23 + 23 + 8 + 12 + 12 + 10 + 10 + 10 + 12,
-       {{"Max_PE_rate", 102}, {"readStage[0]", 1256}, {"readStage19NumOfErrorsBin[11]", 0}}},
-  };
-  for (const auto& c : kCases) {
+  std::vector<std::uint32_t> values;
+  for (std::uint32_t word = 0; word < kChannels * 1024; ++word)
+    values.push_back(1000 * (word / 1024) + word % 1024);
+  for (std::uint32_t field = 0; field < kChannels * 8; ++field)
+    values.push_back(100 * (field / 8) + field % 8);
+  const Bytes list = words(values);
+  // The number of entries of the second channel's record, and some of them.
+  const auto filed = [&](const char* chip, std::initializer_list<const char*> keys) {
     StoragePlatform platform(Array{});
     const Dictionary characteristics{
-        {"chip-id", c.chip}, {"manufacturer-id", "AD825223215F"}, {"num-bus", kChannels}};
+        {"chip-id", chip}, {"manufacturer-id", "AD825223215F"}, {"num-bus", kChannels}};
     EXPECT_TRUE(logTelemetryList(platform.platform, list, characteristics));
     const auto& records = platform.crashReporting.records;
-    ASSERT_EQ(records.size(), kChannels) << c.chip;
-    EXPECT_EQ(records[1].first, 176U);
-    EXPECT_EQ(records[1].second.size(), c.entries) << c.chip;
-    for (const auto& [key, value] : c.values)
-      EXPECT_EQ(records[1].second.get(key), Value(value)) << c.chip << ' ' << key;
-  }
+    if (records.size() != kChannels || records[1].first != 176) return std::string("none");
+    std::string text = format("%zu:", records[1].second.size());
+    for (const char* key : keys)
+      text += " " + textOf(records[1].second.get(key));
+    return text;
+  };
+  EXPECT_EQ(filed("K3V", {"RD", "num_pages", "readStage[22]", "algoNANDAccessesBin[7]"}),
+            "135: 100 106 1091 1113");
+  EXPECT_EQ(filed("K4V", {"block_type", "readStage[32]", "dspExceptionParameter[37]",
+                          "retentionIndication[3]", "retentionIndication[11]"}),
+            "175: 105 1110 1026 1076 0");
+  EXPECT_EQ(filed("other", {"Max_PE_rate", "readStage[0]", "readStage19NumOfErrorsBin[11]"}),
+            "127: 102 1256 0");
 }
 
 TEST(StructuredLogTest, FilesDefectsThatLieInTheBuffer) {
-  Bytes list = words({0, 3, 2});
-  const Bytes defect = words({0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB});
-  list.insert(list.end(), defect.begin(), defect.end());
-  list.insert(list.end(), defect.begin(), defect.end() - 1);
+  Bytes list = words({0, 3, 2, 0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB,  //
+                      0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB});
+  list.pop_back();  // the second lies in it but for one byte
   StoragePlatform platform(Array{});
   EXPECT_TRUE(logDefectsList(platform.platform, list, {}));
   EXPECT_TRUE(logDefectsList(platform.platform, words({0}), {}));

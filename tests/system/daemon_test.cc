@@ -107,9 +107,22 @@ struct Device {
       if (name.ends_with(".event")) ++count;
       if (!name.ends_with(".jsonl")) continue;
       const std::string content = contentOf(entry.path());
-      EXPECT_TRUE(content.starts_with('{') && content.ends_with("}}\n")) << name;
+      EXPECT_TRUE(content.empty() || content.ends_with("}}\n")) << name;
+      std::istringstream lines(content);
+      for (std::string line; std::getline(lines, line);)
+        EXPECT_TRUE(line.starts_with("{\"time\":\"") && line.ends_with("}}")) << line;
       if (name.starts_with("172-")) count += static_cast<int>(std::ranges::count(content, '\n'));
     }
+    return count;
+  }
+
+  /// How many scalars the storage run has set for today.
+  int storageScalars() const {
+    LinuxPlatform linuxPlatform(root);
+    int count = 0;
+    linuxPlatform.platform().statistics.initWithDefaultPath()->scalarsForKeyPrefix(
+        "com.norvane.", yesterday, yesterday + 1,
+        [&count](std::string_view, std::int32_t, std::int64_t, bool&) { ++count; });
     return count;
   }
 
@@ -238,11 +251,16 @@ TEST(DaemonTest, RecoversWhereverARunIsKilled) {
     if (!runUntilSystemCall(calls, [&] { runDaemon(device.root, "-d"); })) break;
     ++kills;
     const std::size_t logsBefore = device.pendingLogs().size();
+    const bool wasDone =
+        device.preference(kTavrelDomain, kLastRunDayKey) == plist::Value(device.yesterday);
+    const bool scalarsBefore = device.storageScalars() != 0;
     ASSERT_EQ(waitFor(forkProcess([&] { runDaemon(device.root, "-d"); })), 0);
     SCOPED_TRACE(format("killed before system call %zu", calls));
     EXPECT_EQ(device.preference(kTavrelDomain, kLastRunDayKey), plist::Value(device.yesterday));
     EXPECT_EQ(device.preference(kTavrelDomain, kTaskingIDKey), plist::Value("t"));
     EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
+    // Once the day is remembered, what the store has not committed is lost with the process.
+    EXPECT_EQ(device.storageScalars(), wasDone && !scalarsBefore ? 0 : 335);
     const int lost = kEccEvents - device.eccEvents();
     EXPECT_TRUE(lost == 0 || lost == 1) << lost;  // taken, and not filed yet
     const std::size_t logs = device.pendingLogs().size();

@@ -21,10 +21,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const std::string kNoXmlText =
       "tavrelctl: cannot be stored: property lists hold no control characters and only UTF-8: give "
       "such bytes as --plist '{\"$data\": \"BASE64\"}'\n";
-  const struct {
-    std::vector<std::string> arguments;
-    std::string error;
-  } kCases[] = {
+  const std::pair<std::vector<std::string>, std::string> kCases[] = {
       {{}, "tavrelctl: A subcommand is required: see 'tavrelctl --help'\n"},
       {{"log"}, "tavrelctl: A subcommand is required: see 'tavrelctl log --help'\n"},
       {{"prefs", "get", "a"}, "tavrelctl: KEY is required: see 'tavrelctl prefs get --help'\n"},
@@ -39,8 +36,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {{"prefs", "set", "a", "k", "@1e300", "--date"}, ""},
       {{"prefs", "set", "a", "k", "1", "--int", "--bool"}, ""},
       {{"log", "show", "--raw", "--json"}, ""},
-      {{"status", "--wrong"}, ""},
-  };
+      {{"status", "--wrong"}, ""}};
   for (const auto& [arguments, error] : kCases) {
     const Outcome outcome = device.run(arguments);
     EXPECT_EQ(outcome.status, 2) << outcome;
@@ -71,10 +67,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
 
 TEST(Prefs, KeepTheKindThatWasAskedFor) {
   const TemporaryDevice device;
-  const struct {
-    std::string kind, text;
-    std::string shown, json;
-  } kCases[] = {
+  const std::tuple<std::string, std::string, std::string, std::string> kCases[] = {
       {"--string", "a b", "a b\n", R"("a b")"},
       {"--bool", "yes", "true\n", "true"},
       {"--int", "-9223372036854775808", "-9223372036854775808\n", "-9223372036854775808"},
@@ -84,8 +77,7 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
       {"--date", "2026-11-16", "2026-11-16 00:00:00 +0000\n",
        R"({"$date":"2026-11-16T00:00:00Z"})"},
       {"--plist", R"({"b": [1], "a": {"$data": "/w=="}})", "a = <ff>\nb:\n  [0] = 1\n",
-       R"({"a":{"$data":"/w=="},"b":[1]})"},
-  };
+       R"({"a":{"$data":"/w=="},"b":[1]})"}};
   for (const auto& [kind, text, shown, json] : kCases) {
     EXPECT_EQ(device.run({"prefs", "set", kind, "com.example.a", "key", "--", text}), prints(""));
     EXPECT_EQ(device.run({"prefs", "get", "com.example.a", "key"}), prints(shown));

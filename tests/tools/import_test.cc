@@ -11,40 +11,27 @@ namespace {
 constexpr const char* kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
 
 TEST(ExactDouble, ReadsWhatStrtodReadsAndWritesEveryBit) {
-  const struct {
-    const char* text;
-    std::uint64_t bits;
-    const char* written;
-  } cases[] = {
-      {"0", 0, "0"},
-      {"-0", 0x8000000000000000, "-0"},
-      {"+1.5", 0x3FF8000000000000, "1.5"},
-      {" 1", 0x3FF0000000000000, "1"},
-      {".5e1", 0x4014000000000000, "5"},
-      {"0x1.8p-3", 0x3FC8000000000000, "0.1875"},
-      {"-0X.8P+1", 0xBFF0000000000000, "-1"},
-      {"0.1", 0x3FB999999999999A, "0.1"},
-      {"9007199254740993", 0x4340000000000000, "9007199254740992"},
-      {"4.9406564584124654e-324", 1, "5e-324"},
-      {"1e-400", 0, "0"},
-      {"1.7976931348623157e308", 0x7FEFFFFFFFFFFFFF, "1.7976931348623157e+308"},
-      {"inf", 0x7FF0000000000000, "inf"},
-      {"-Infinity", 0xFFF0000000000000, "-inf"},
-      {"nan", 0x7FF8000000000000, "nan"},
-      {"+NaN()", 0x7FF8000000000000, "nan"},
-      {"-nan", 0xFFF8000000000000, "-nan"},
-      {"nan(0x123)", 0x7FF8000000000123, "nan(0x123)"},
-      {"nan(text)", 0x7FF8000000000000, "nan"},
-      {"-nan(9218868437227405313)", 0xFFF0000000000001, "-nan(0x7ff0000000000001)"},
-  };
-  for (const auto& item : cases) {
-    const auto value = parseExactDouble(item.text);
-    ASSERT_TRUE(value) << item.text << value.error().message;
-    EXPECT_EQ(std::bit_cast<std::uint64_t>(*value), item.bits) << item.text;
+  using Case = std::tuple<const char*, std::uint64_t, const char*>;
+  for (const auto& [text, bits, shown] :
+       {Case("0", 0, "0"), Case("-0", 0x8000000000000000, "-0"),
+        Case("+1.5", 0x3FF8000000000000, "1.5"), Case(" 1", 0x3FF0000000000000, "1"),
+        Case(".5e1", 0x4014000000000000, "5"), Case("0x1.8p-3", 0x3FC8000000000000, "0.1875"),
+        Case("-0X.8P+1", 0xBFF0000000000000, "-1"), Case("0.1", 0x3FB999999999999A, "0.1"),
+        Case("9007199254740993", 0x4340000000000000, "9007199254740992"),
+        Case("4.9406564584124654e-324", 1, "5e-324"), Case("1e-400", 0, "0"),
+        Case("1.7976931348623157e308", 0x7FEFFFFFFFFFFFFF, "1.7976931348623157e+308"),
+        Case("inf", 0x7FF0000000000000, "inf"), Case("-Infinity", 0xFFF0000000000000, "-inf"),
+        Case("+NaN()", 0x7FF8000000000000, "nan"), Case("-nan", 0xFFF8000000000000, "-nan"),
+        Case("nan(0x123)", 0x7FF8000000000123, "nan(0x123)"),
+        Case("nan(text)", 0x7FF8000000000000, "nan"),
+        Case("-nan(9218868437227405313)", 0xFFF0000000000001, "-nan(0x7ff0000000000001)")}) {
+    const auto value = parseExactDouble(text);
+    ASSERT_TRUE(value) << text << value.error().message;
+    EXPECT_EQ(std::bit_cast<std::uint64_t>(*value), bits) << text;
     std::string written;
     appendExactDouble(written, *value);
-    EXPECT_EQ(written, item.written);
-    EXPECT_EQ(std::bit_cast<std::uint64_t>(*parseExactDouble(written)), item.bits) << written;
+    EXPECT_EQ(written, shown);
+    EXPECT_EQ(std::bit_cast<std::uint64_t>(*parseExactDouble(written)), bits) << written;
   }
   for (const char* text : {"", " ", "x", "1x", "1 ", "--1", "0x", "nan(", "nan(-1)", "infinit"})
     EXPECT_FALSE(parseExactDouble(text)) << text;
@@ -52,10 +39,7 @@ TEST(ExactDouble, ReadsWhatStrtodReadsAndWritesEveryBit) {
 }
 
 TEST(StatImport, RefusesABadLineAndKeepsNothing) {
-  const struct {
-    std::string line;
-    const char* reason;
-  } cases[] = {
+  const std::pair<std::string, const char*> cases[] = {
       {"", "the line is empty"},
       {"gauge\t1\tk\t1",
        "a line begins with \"scalar\" or \"value\" and a tab, not with: gauge\\t1\\tk\\t1"},
@@ -70,16 +54,15 @@ TEST(StatImport, RefusesABadLineAndKeepsNothing) {
       {"scalar\t1\tk\t9223372036854775808", "not a 64-bit integer: 9223372036854775808"},
       {"scalar\t1\tk\t1\r", "not a 64-bit integer: 1\\x0d"},
       {"value\t1\tk\t-1\t1", "seconds within the day are 0 to 4294967295, not: -1"},
-      {"value\t1\tk\t1\tone", "not a number: one"},
-  };
+      {"value\t1\tk\t1\tone", "not a number: one"}};
   const TemporaryDevice device;
   ASSERT_EQ(device.run({"stat", "set", "before", "1"}).status, 0);
   const auto before = device.run({"stat", "export"});
-  for (const auto& item : cases) {
+  for (const auto& [line, reason] : cases) {
     const std::string good = "scalar\t1\tk\t1\nvalue\t1\tk\t1\t1\n";
-    const Outcome outcome = device.run({"stat", "import"}, good + item.line + "\n" + good);
+    const Outcome outcome = device.run({"stat", "import"}, good + line + "\n" + good);
     EXPECT_EQ(outcome, (Outcome{1, "",
-                                std::string("tavrelctl: standard input:3: ") + item.reason +
+                                std::string("tavrelctl: standard input:3: ") + reason +
                                     "; nothing of the file was kept\n"}));
   }
   const std::string endless(3U << 20, 'x');

@@ -173,11 +173,8 @@ TEST(Rehearse, TellsEveryStepAndChangesNothing) {
   EXPECT_EQ(device.files(), before);
 
   const std::string verbose = device.text({"--today", "-v"});
-  for (const char* line : {
-           "\n    |     <key>app.starts</key>\n",
-           "\n    | Hardware Model: Board\n",
-           "\n  would file record of type 176: {\"Factory Count\": 7}\n",
-       }) {
+  for (const char* line : {"\n    |     <key>app.starts</key>\n", "\n    | Hardware Model: Board\n",
+                           "\n  would file record of type 176: {\"Factory Count\": 7}\n"}) {
     EXPECT_NE(verbose.find(line), std::string::npos) << line << verbose;
   }
 }

@@ -65,8 +65,7 @@ TEST_F(SendTest, ChecksApplicationsBeforeItSends) {
       {R"([{"bundle_id": "a", "version": "1", "orbo_id": 1.5}])",
        "application 0: \"orbo_id\" must be an integer"},
       {"[{" + good + R"(, "uuid": "00112233-4455-6677-8899aaabbccddeeff"}])",
-       "application 0: \"uuid\" must be a UUID, as text of 36 characters or 16 bytes of data"},
-  };
+       "application 0: \"uuid\" must be a UUID, as text of 36 characters or 16 bytes of data"}};
   for (const auto& [document, reason] : cases)
     EXPECT_EQ(device.run({"send", "deliver", "-"}, document), fails("standard input: " + reason));
 }

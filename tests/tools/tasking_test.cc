@@ -62,11 +62,7 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
 }
 
 TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
-  struct Case {
-    const char* document;
-    std::vector<std::string> findings;
-  };
-  const Case cases[] = {
+  const std::pair<const char*, std::vector<std::string>> cases[] = {
       {"[1]", {"tasking: must be a dictionary, not an array"}},
       {R"({"TaskingId": "x"})",
        {"TaskingId: has no meaning; a device knows TaskingID, TaskingDigest, TaskingPayload",
@@ -84,13 +80,12 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
        {"TaskingPayload[0]: holds text that no preference can: property lists hold no control "
-        "characters and only UTF-8: give such bytes as data"}},
-  };
-  for (const Case& row : cases) {
+        "characters and only UTF-8: give such bytes as data"}}};
+  for (const auto& [document, findings] : cases) {
     std::string lines;
-    for (const std::string& finding : row.findings)
+    for (const std::string& finding : findings)
       lines += "tavrelctl: standard input: " + finding + "\n";
-    EXPECT_EQ(run({"schedule", "-"}, row.document), (Outcome{1, "", lines}));
+    EXPECT_EQ(run({"schedule", "-"}, document), (Outcome{1, "", lines}));
   }
   const std::string none = device.path("/none");
   EXPECT_EQ(run({"schedule", none}), fails("cannot read " + none + ": No such file or directory"));

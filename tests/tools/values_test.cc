@@ -6,7 +6,6 @@
 
 #include "tools/base64.h"
 #include "tools/day_argument.h"
-#include "tools/distribution_view.h"
 #include "tools/json_value.h"
 #include "tools/table.h"
 #include "tools/value_text.h"
@@ -30,8 +29,7 @@ TEST(JsonValue, EveryValueReadsBackEqual) {
       {"date", plist::Date::since1970(1794851738.25)},
       {"array", plist::Array{1, plist::Array::create(), plist::Dictionary::create()}},
       {"$data", "no bytes"},
-      {"$$", 1},
-  };
+      {"$$", 1}};
   const std::string text = jsonOf(everything).dump();
   EXPECT_NE(text.find(R"("$$data":"no bytes","array":[1,[],{}],"beyond doubles":9007199254740993)"),
             std::string::npos)
@@ -47,9 +45,7 @@ TEST(JsonValue, EveryValueReadsBackEqual) {
 }
 
 TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
-  const struct {
-    std::string text, message;
-  } kCases[] = {
+  const std::pair<std::string, std::string> kCases[] = {
       {R"({"a": {"b": null}})", "JSON/a/b: null has no place in a property list"},
       {"18446744073709551616", "JSON: the integer 18446744073709551616 does not fit 64 bits"},
       {R"({"$data": "?"})", "JSON/$data: \"$data\" is no base64"},
@@ -58,8 +54,7 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
        "JSON/$date: not a date: today: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD"},
       {R"({"$data": "", "x": 1})", "JSON/x: \"$data\" stands alone in its object and holds a text"},
       {R"({"$x": 1})", "JSON/$x: \"$x\" is no known form: write a key that begins with $ as $$"},
-      {std::string(200, '['), "JSON: nested too deeply"},
-  };
+      {std::string(200, '['), "JSON: nested too deeply"}};
   for (const auto& [text, message] : kCases) {
     const auto value = parseJsonValue(text);
     ASSERT_FALSE(value) << text;
@@ -98,17 +93,12 @@ TEST(Dates, AreReadAsTheyAreWritten) {
 }
 
 TEST(Days, AreNumbersOrDates) {
-  const struct {
-    std::string_view text;
-    std::int32_t day;
-    std::string_view shown;
-  } kCases[] = {
+  const std::tuple<std::string_view, std::int32_t, std::string_view> kCases[] = {
       {"0", 0, "0 (1970-01-01)"},
       {"2026-11-16", 20773, "20773 (2026-11-16)"},
       {"-1", -1, "-1 (1969-12-31)"},
       {"2147483647", 2147483647, "2147483647 (5881580-07-11)"},
-      {"-2147483648", std::numeric_limits<std::int32_t>::min(), "-2147483648 (-5877641-06-23)"},
-  };
+      {"-2147483648", std::numeric_limits<std::int32_t>::min(), "-2147483648 (-5877641-06-23)"}};
   for (const auto& [text, day, shown] : kCases) {
     const auto parsed = parseDay(text);
     ASSERT_TRUE(parsed) << text;
@@ -151,28 +141,6 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
   EXPECT_EQ(bar(1, 1000000, 40), "#");
   EXPECT_EQ(bar(20, 40, 40), std::string(20, '#'));
   EXPECT_EQ(bar(0, 40, 40), "");
-}
-
-TEST(DistributionView, OrdersBucketsByTheirEndsAndPassesOverWhatIsNoSummary) {
-  const plist::Dictionary log{
-      {"BHDistributions", plist::Dictionary{{"b", plist::Array{1.0, 4.0, 2.5, 5.0, 4}},
-                                            {"a", plist::Array{0.0, 0.0, 0.0, 0.0, 0}},
-                                            {"short", plist::Array{1.0}},
-                                            {"text", plist::Array{"x", 4.0, 2.5, 5.0, 4}}}},
-      {"BHDistributionsHistogram", plist::Dictionary{{"b", plist::Dictionary{{"(100, inf)", 1},
-                                                                             {"(20, 100]", 4},
-                                                                             {"odd", 9},
-                                                                             {"(-inf, 3]", 2},
-                                                                             {"(3, 20]", 3}}}}}};
-  const auto views = distributionsOf(log);
-  ASSERT_EQ(views.size(), 2U);
-  EXPECT_EQ(views[0].key, "a");
-  EXPECT_FALSE(views[0].standardDeviation());
-  EXPECT_EQ(*views[1].standardDeviation(), std::sqrt(1.25));
-  std::string order;
-  for (const auto& bucket : views[1].buckets)
-    order += bucket.label + ' ';
-  EXPECT_EQ(order, "(-inf, 3] (3, 20] (20, 100] (100, inf) odd ");
 }
 
 TEST(ValueText, ShowsTheKindOfAValue) {
