@@ -17,6 +17,8 @@ void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo) {
     return;
   }
   dailyTasksForDay(platform, yesterday, appInfo);
+  // What the tasks have set must not be lost to a kill once the day counts as done.
+  platform.statistics.BHClientCheckpoint();
   platform.preferences.ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   platform.preferences.ZTXPreferencesSynchronize(kTavrelDomain);
 }

@@ -78,7 +78,8 @@ struct ListenerTest : ::testing::Test {
   }
 
   int runs() const {
-    return static_cast<int>(std::count(fake.journal.begin(), fake.journal.end(), "checkpoint"));
+    return static_cast<int>(
+        std::count(fake.journal.begin(), fake.journal.end(), "clean structured logs"));
   }
   bool wasPosted() const {
     return std::count(fake.journal.begin(), fake.journal.end(),

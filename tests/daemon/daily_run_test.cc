@@ -29,6 +29,7 @@ const fakes::Journal kGatedTasks{"checkpoint",
                                  kFree,
                                  "clean structured logs",
                                  "roll support log",
+                                 "checkpoint",
                                  "set com.norvane.tallied.tavrel " + std::string(kDayKey),
                                  "synchronize com.norvane.tallied.tavrel"};
 
