@@ -54,7 +54,7 @@ constexpr StepOpening kSteps[] = {
        return event.kind == Kind::Fact && event.subject == "system version";
      }},
     {"Roll-over of the support log", is<Kind::RollOver>},
-    {"End of the gated run", is<Kind::SetPreference>},
+    {"End of the gated run", is<Kind::Checkpoint>},
 };
 
 /// Files events under the step that they belong to.
@@ -62,7 +62,7 @@ class StepRecorder {
  public:
   void record(const OverlayEvent& event) {
     for (std::size_t step = current_ + 1; step < std::size(kSteps); ++step) {
-      // Preferences are set by many; the last step is the one behind the roll-over.
+      // The store is checkpointed at the start too; the last step is the one behind the roll-over.
       const bool isLast = step + 1 == std::size(kSteps);
       if (isLast && current_ + 2 != std::size(kSteps)) break;
       if (!kSteps[step].opens(event)) continue;

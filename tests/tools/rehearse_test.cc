@@ -186,6 +186,7 @@ Roll-over of the support log
   would roll the support log, unless it is empty
 
 End of the gated run
+  would checkpoint the statistics store
   would set preference com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 = YESTERDAY
   would write preferences of com.norvane.tallied.tavrel
 
