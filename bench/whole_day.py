@@ -88,24 +88,46 @@ def write(path, content):
         file.write(content)
 
 
-def make_device(bin_directory, day):
-    generator = random.Random(7)
+def make_store(bin_directory, scalars, distributions, values):
+    """A device that has statistics, all of them whitelisted, and nothing else."""
     device = Device(bin_directory)
     device.tool("stat", "import", "-", text="".join(
-        scalar_lines(day.scalars) + value_lines(day.distributions, day.values)))
-    device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(day.scalars)],
+        scalar_lines(scalars) + value_lines(distributions, values)))
+    device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(scalars)],
                      distributions=[f"com.example.distribution.{i:04}"
-                                    for i in range(day.distributions)],
+                                    for i in range(distributions)],
                      options={"intervals": [10.0 * i for i in range(1, 21)]})
-    write(device.path(REGISTRY),
-          plistlib.dumps(registry(day, generator), fmt=plistlib.FMT_BINARY))
-    for i in range(day.ecc_events):
-        write(device.path(f"{ECC_FOLDER}/{i:04}.event"),
-              struct.pack("<BB6x8Q", i % 256, 8, *range(8)))
     subprocess.run(["sqlite3", device.path(STORE), "PRAGMA wal_checkpoint(TRUNCATE)"], check=True,
                    stdout=subprocess.DEVNULL)
-    subprocess.run(["sync"], check=True)
     return device
+
+
+class Devices:
+    """Makes devices. Importing takes the longest by far, so each store is made once and copied."""
+
+    def __init__(self, bin_directory):
+        self.bin_directory = bin_directory
+        self.stores = {}
+
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *_):
+        for store in self.stores.values():
+            store.close()
+
+    def make(self, day):
+        statistics_of_day = day.scalars, day.distributions, day.values
+        if statistics_of_day not in self.stores:
+            self.stores[statistics_of_day] = make_store(self.bin_directory, *statistics_of_day)
+        device = self.stores[statistics_of_day].copy()
+        write(device.path(REGISTRY),
+              plistlib.dumps(registry(day, random.Random(7)), fmt=plistlib.FMT_BINARY))
+        for i in range(day.ecc_events):
+            write(device.path(f"{ECC_FOLDER}/{i:04}.event"),
+                  struct.pack("<BB6x8Q", i % 256, 8, *range(8)))
+        subprocess.run(["sync"], check=True)
+        return device
 
 
 def run(device, prefix=()):
@@ -154,8 +176,8 @@ def scalar_rows(device, since):
     return int(rows), int(size)
 
 
-def flushes(bin_directory, day):
-    device = make_device(bin_directory, day)
+def flushes(devices, day):
+    device = devices.make(day)
     with tempfile.NamedTemporaryFile("r") as file:
         run(device, ["strace", "-f", "-y", "-e", "trace=fsync,fdatasync", "-o", file.name])
         calls = [line for line in file if "sync(" in line]
@@ -166,28 +188,28 @@ def flushes(bin_directory, day):
         print(f"    {line.split()[1].split('(')[0]:<10} {path.replace(device.root, '')}")
 
 
-def busy_day(bin_directory):
+def busy_day(devices):
     print("A gated day:", ", ".join(f"{count:,} {name}" for name, count in BUSY._asdict().items()))
     results = []
     for _ in range(RUNS):
-        device = make_device(bin_directory, BUSY)
+        device = devices.make(BUSY)
         before = files_of(device)
         results.append(run(device))
         content = content_bytes(before, files_of(device))
         rows, size = scalar_rows(device, DAY)
         device.close()
     cpu, written = (statistics.median(column) for column in zip(*results))
-    device = make_device(bin_directory, BUSY)
+    device = devices.make(BUSY)
     memory = peak_mebibytes(device.daemon("-d"), device.environment)
     device.close()
     print(f"  CPU                    {cpu * 1e3:10.2f} ms\n  peak memory            {memory:10.2f} MiB")
     print(f"  written                {written:10,} bytes, {written / (content + size):.2f} of the "
           f"content: {content:,} bytes in files, {size:,} in {rows:,} scalars")
     if shutil.which("strace"):
-        flushes(bin_directory, BUSY)
+        flushes(devices, BUSY)
 
 
-def growth(bin_directory):
+def growth(devices):
     print("\nCPU of the day when one of its numbers grows, ms")
     for name in Day._fields:
         figures = []
@@ -195,7 +217,7 @@ def growth(bin_directory):
             day = BUSY._replace(**{name: getattr(BUSY, name) * factor})
             times = []
             for _ in range(3):
-                device = make_device(bin_directory, day)
+                device = devices.make(day)
                 times.append(run(device)[0])
                 device.close()
             figures.append(f"x{factor} {min(times) * 1e3:8.2f}")
@@ -203,8 +225,9 @@ def growth(bin_directory):
 
 
 def main():
-    busy_day(sys.argv[1])
-    growth(sys.argv[1])
+    with Devices(sys.argv[1]) as devices:
+        busy_day(devices)
+        growth(devices)
 
 
 if __name__ == "__main__":

@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""Times whole processes beside the sqlite3 tool on the same data.
+"""Times whole processes, beside the sqlite3 tool on the same data where it can do the same.
 
     bench/whole_runs.py BIN_DIRECTORY
 
@@ -8,11 +8,14 @@ and the ratio to the baseline. Times of the machine's other work do not count. I
 counted with valgrind, where it is installed.
 """
 
+import copy
 import os
 import plistlib
 import random
+import re
 import shutil
 import statistics
+import struct
 import subprocess
 import sys
 import tempfile
@@ -33,6 +36,14 @@ class Device:
         self.environment = {"PATH": os.environ["PATH"], "TAVREL_ROOT": self.root}
         self.tool("prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionEnabled", "true",
                   "--bool")
+
+    def copy(self):
+        """Another device with the same content."""
+        twin = copy.copy(self)
+        twin.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.")
+        twin.environment = {**self.environment, "TAVREL_ROOT": twin.root}
+        shutil.copytree(self.root, twin.root, dirs_exist_ok=True)
+        return twin
 
     def path(self, name):
         return os.path.join(self.root, name)
@@ -151,6 +162,64 @@ def distributions(bin_directory):
     device.close()
 
 
+SIMPLE, STATE, HISTOGRAM, SIMPLE_ARRAY = 1, 2, 3, 4
+ELEMENTS = {SIMPLE: 1, STATE: 4, HISTOGRAM: 8, SIMPLE_ARRAY: 2}
+
+
+def report_channels(count, formats):
+    """A recording of report channels, of which drivers have a hundred each."""
+    services, hub = [], []
+    for driver in range(1, count // 100 + 1):
+        legend = []
+        for kind in formats:
+            info = {"IOReportChannelUnit": 0}
+            if kind == HISTOGRAM:
+                info["IOReportChannelConfig"] = struct.pack("<IIIi", 100, 0, 0, ELEMENTS[kind])
+            legend.append({"IOReportGroupName": "Disk", "IOReportSubGroupName": f"Format {kind}",
+                           "IOReportChannelInfo": info, "IOReportChannels": []})
+        for channel in range(1, 101):
+            position = channel % len(formats)
+            elements = ELEMENTS[formats[position]]
+            word = formats[position] | 1 << 16 | elements << 32
+            legend[position]["IOReportChannels"].append(
+                [channel, word, f"channel {channel} of driver {driver}"])
+            content = b"".join(struct.pack("<QQQQ4q", driver, channel, word, 1, 100 * i, i, i, i)
+                               for i in range(1, elements + 1))
+            hub.append({"DriverID": driver, "ChannelID": channel, "Elements": content})
+        services.append({"Class": "Disk", "EntryID": driver, "Properties": {
+            "IOReportLegendPublic": True, "IOReportLegend": legend}})
+    return {"Services": services, "Hub": {"Channels": hub}}
+
+
+def channels_shown(command, environment):
+    """How many channels the output tells of, each once."""
+    output = subprocess.run(command, env=environment, check=True, capture_output=True,
+                            text=True).stdout
+    return len(set(re.findall(r"channel \d+ of driver \d+", output)))
+
+
+def report_samples(bin_directory):
+    count = 10_000
+    print(f"\ntavrelctl report sample --count 1, {count:,} channels "
+          "(wanted: <= 100 ms, < 64 MiB)")
+    for label, formats in (("simple", [SIMPLE]), ("all formats", list(ELEMENTS))):
+        recording = report_channels(count, formats)
+        for encoding, form in (("binary", plistlib.FMT_BINARY), ("XML", plistlib.FMT_XML)):
+            device = Device(bin_directory)
+            path = device.path("var/lib/tavrel/registry/report.plist")
+            os.makedirs(os.path.dirname(path))
+            with open(path, "wb") as file:
+                file.write(plistlib.dumps(recording, fmt=form))
+            for options in ([], ["--json"]):
+                command = [os.path.join(device.bin, "tavrelctl"), "report", "sample", "--count",
+                           "1", *options]
+                shown = channels_shown(command, device.environment)
+                if shown != count:
+                    raise SystemExit(f"report sample showed {shown} of {count} channels")
+                measure(" ".join([label, encoding, *options]), command, device.environment)
+            device.close()
+
+
 def growth(bin_directory):
     if not shutil.which("valgrind"):
         print("\nInstructions by number of scalars: valgrind is not installed")
@@ -185,6 +254,7 @@ def main():
     daily_scalars(bin_directory)
     nothing_to_do(bin_directory)
     distributions(bin_directory)
+    report_samples(bin_directory)
     growth(bin_directory)
 
 
