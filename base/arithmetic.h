@@ -24,15 +24,8 @@ constexpr std::int32_t previousDay(std::int32_t day) {
 constexpr std::uint64_t shiftLeft(std::uint64_t value, unsigned bits) {
   return bits < 64 ? value << bits : 0;
 }
-constexpr std::uint64_t shiftRight(std::uint64_t value, unsigned bits) {
-  return bits < 64 ? value >> bits : 0;
-}
 
-/// Sums and products of sizes, or nothing where they would wrap.
-constexpr std::optional<std::uint64_t> checkedAdd(std::uint64_t a, std::uint64_t b) {
-  if (a > std::numeric_limits<std::uint64_t>::max() - b) return std::nullopt;
-  return a + b;
-}
+/// A product of sizes, or nothing where it would wrap.
 constexpr std::optional<std::uint64_t> checkedMultiply(std::uint64_t a, std::uint64_t b) {
   if (b != 0 && a > std::numeric_limits<std::uint64_t>::max() / b) return std::nullopt;
   return a * b;

@@ -35,26 +35,10 @@ constexpr Word assembleLittle(const std::byte* at) {
 }
 
 template <class Word>
-constexpr Word assembleBig(const std::byte* at) {
-  std::uint64_t word = 0;
-  for (std::size_t i = 0; i < sizeof(Word); ++i) {
-    word = word << 8 | std::to_integer<std::uint64_t>(at[i]);
-  }
-  return static_cast<Word>(word);
-}
-
-template <class Word>
 constexpr std::optional<Word> loadLittle(ByteSpan bytes, std::uint64_t offset) {
   const auto part = slice(bytes, offset, sizeof(Word));
   if (!part) return std::nullopt;
   return assembleLittle<Word>(part->data());
-}
-
-template <class Word>
-constexpr std::optional<Word> loadBig(ByteSpan bytes, std::uint64_t offset) {
-  const auto part = slice(bytes, offset, sizeof(Word));
-  if (!part) return std::nullopt;
-  return assembleBig<Word>(part->data());
 }
 
 template <class Word>
@@ -80,15 +64,6 @@ constexpr std::optional<std::uint32_t> loadLittle32(ByteSpan bytes, std::uint64_
 }
 constexpr std::optional<std::uint64_t> loadLittle64(ByteSpan bytes, std::uint64_t offset) {
   return bytes_detail::loadLittle<std::uint64_t>(bytes, offset);
-}
-constexpr std::optional<std::uint16_t> loadBig16(ByteSpan bytes, std::uint64_t offset) {
-  return bytes_detail::loadBig<std::uint16_t>(bytes, offset);
-}
-constexpr std::optional<std::uint32_t> loadBig32(ByteSpan bytes, std::uint64_t offset) {
-  return bytes_detail::loadBig<std::uint32_t>(bytes, offset);
-}
-constexpr std::optional<std::uint64_t> loadBig64(ByteSpan bytes, std::uint64_t offset) {
-  return bytes_detail::loadBig<std::uint64_t>(bytes, offset);
 }
 
 /// The stores answer false, and write nothing, when the word would not fit.

@@ -1,6 +1,7 @@
 // Hashing of texts that come from outside.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 
@@ -9,5 +10,10 @@ namespace tavrel {
 /// SipHash-1-3 under a key drawn once per process: whoever writes the texts cannot make them
 /// collide. Values differ from process to process and must not decide about any order.
 std::uint64_t keyedHash(std::string_view text);
+
+/// The same for hash tables.
+struct KeyedHash {
+  std::size_t operator()(std::string_view text) const { return keyedHash(text); }
+};
 
 }  // namespace tavrel

@@ -14,8 +14,10 @@ inline constexpr std::int32_t kLargestFormatWidth = 4096;
 /// no document of ours is deeper than ten.
 inline constexpr std::size_t kPropertyListDepth = 128;
 
-/// Values in one property list after shared references are expanded. Binary documents may refer to
-/// one container from many places, so that a few bytes could stand for an endless tree.
+/// Values in one property list that is read, or written in binary, after shared references are
+/// expanded. Binary documents may refer to one container from many places, so that a few bytes
+/// could stand for an endless tree. What is written as XML, the daily log, is limited by its bytes
+/// alone.
 inline constexpr std::size_t kPropertyListValues = 1'000'000;
 
 /// Bytes of a property-list document. Larger than any preference domain, recording or message.
@@ -61,8 +63,8 @@ inline constexpr std::size_t kSystemFactBytes = 64U << 10;
 /// How long the lock of a file that another process writes is waited for, in milliseconds.
 inline constexpr int kFileLockMilliseconds = 10'000;
 
-/// Bytes of a key in the statistics store. Keys are names; ten times the longest that was ever
-/// seen, and short enough that a day's rows are read in little memory.
+/// Bytes of a key in the statistics store. Keys are names, far shorter than this; a row with one
+/// is read whole, so that nobody's key may decide how much memory that costs.
 inline constexpr std::size_t kStoreKeyBytes = 1U << 20;
 
 /// Age after which a temporary file that a killed process left behind is removed, in seconds.
@@ -100,6 +102,12 @@ inline constexpr std::size_t kTextLineBytes = 64U << 10;
 
 /// Desktop entries that are counted. Their names are held while counting.
 inline constexpr std::size_t kDesktopEntries = 100'000;
+
+/// Files and folders that are looked at for desktop entries. Users put what they like into theirs.
+inline constexpr std::size_t kDesktopFiles = 1'000'000;
+
+/// Bytes of a desktop entry. One with translations for every language stays below 100 kB.
+inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 
 /// Languages in one list. Matching compares every preferred with every available one; the system's
 /// own list of all locales has some 500.

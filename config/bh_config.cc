@@ -39,6 +39,7 @@ bool BHConfig::load() {
   const auto bytes = platform_.files.read(kWhitelistPath, limits::kWhitelistBytes);
   if (!bytes) {
     platform_.log.log(LogLevel::Error, "Couldn't load whitelist");
+    platform_.log.write(LogLevel::Error, bytes.error().message);
     return false;
   }
   appendHex(_configFileDigest, platform_.digest.md5(asBytes(*bytes)));

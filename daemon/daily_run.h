@@ -12,7 +12,8 @@ namespace tavrel {
 /// the list of activated applications, an empty handle when there is none.
 void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo);
 
-/// The tasks for one day, without the gate. No task's failure stops the ones behind it.
+/// The tasks for one day, without the gate. No task's failure, not even an exception, stops the
+/// ones behind it.
 void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo);
 
 }  // namespace tavrel

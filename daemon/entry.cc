@@ -6,6 +6,7 @@
 #include "base/arithmetic.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/daily_run.h"
+#include "platform/guarded.h"
 
 namespace tavrel {
 namespace {
@@ -26,8 +27,10 @@ bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {
 
 void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
   const auto listener = startAppInfoListener(platform);
-  if (!waitUntilIdle(platform.eventLoop, idleSlice)) return;
-  if (!platform.state.appInfoRequested) return;
+  bool isIdle = true;  // also when a message could not be handled to its end
+  runGuarded(platform.log, "go on serving",
+             [&] { isIdle = waitUntilIdle(platform.eventLoop, idleSlice); });
+  if (!isIdle || !platform.state.appInfoRequested) return;
   platform.log.log(LogLevel::Default, "never received requested AAI, so moving along without it");
   runDailyIfNeeded(platform, plist::Array());
 }
@@ -52,11 +55,13 @@ void runArgument(Platform& platform, const char* argument) {
 int runTavrel(Platform& platform, std::span<const char* const> arguments,
               std::chrono::milliseconds idleSlice) {
   platform.log.log(LogLevel::Default, "tavrel started");
-  if (arguments.size() == 1) {
-    serve(platform, idleSlice);
-  } else if (arguments.size() >= 2) {
-    runArgument(platform, arguments[1]);
-  }
+  runGuarded(platform.log, "finish the run", [&] {
+    if (arguments.size() == 1) {
+      serve(platform, idleSlice);
+    } else if (arguments.size() >= 2) {
+      runArgument(platform, arguments[1]);
+    }
+  });
   platform.log.log(LogLevel::Default, "tavrel ended");
   return 0;
 }

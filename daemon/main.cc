@@ -1,14 +1,32 @@
+#include <csignal>
 #include <cstddef>
 #include <exception>
+#include <fcntl.h>
 #include <span>
+#include <unistd.h>
 
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/linux_system_log.h"
 
+namespace {
+
+/// A reader of standard error that has gone must not end the run, and a log line must not go into a
+/// data file that was given the number of a standard stream which was closed at the start.
+void secureStandardStreams() {
+  std::signal(SIGPIPE, SIG_IGN);
+  int descriptor = 0;
+  while (descriptor >= 0 && descriptor <= STDERR_FILENO)
+    descriptor = open("/dev/null", O_RDWR);
+  if (descriptor >= 0) close(descriptor);
+}
+
+}  // namespace
+
 // The exit status is 0 whatever happened: nobody restarts the daemon, the next day does.
 int main(int argc, char** argv) {
   using namespace tavrel;
+  secureStandardStreams();
   try {
     LinuxPlatform linuxPlatform(DeviceRoot::fromEnvironment());
     return runTavrel(linuxPlatform.platform(),

@@ -76,6 +76,7 @@ class Tracker {
     const plist::Value appliedOS = own(kTaskingOSKey);
     if (appliedID == newID && appliedOS == build_) return true;
 
+    if (!canBeRemembered(scheduled)) return true;
     PreferenceWriter writer(platform_.preferences);
     if (appliedID) {
       platform_.log.log(LogLevel::Default,
@@ -105,6 +106,23 @@ class Tracker {
  private:
   plist::Value own(std::string_view key) {
     return platform_.preferences.ZTXPreferencesGetValue(key, kTavrelDomain);
+  }
+
+  /// Says so when it cannot. Settings that are applied and not remembered could never be undone.
+  bool canBeRemembered(const plist::Dictionary& scheduled) {
+    if (!scheduled.array(kTaskingPayloadKey)) return true;  // nothing is
+    auto kept = plist::Dictionary::create();
+    for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey})
+      kept.set(key, scheduled.get(key));
+    const auto xml = platform_.propertyLists.encodeXml(kept);
+    if (xml && xml->size() <= Preferences::kLargestChange) return true;
+    platform_.log.log(LogLevel::Error,
+                      "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
+                      kScheduledTaskingKey, kScheduleDomain,
+                      xml ? format("it needs %zu bytes and may have %zu", xml->size(),
+                                   Preferences::kLargestChange)
+                          : xml.error().message);
+    return false;
   }
 
   void undo(PreferenceWriter& writer) {

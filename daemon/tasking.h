@@ -7,7 +7,8 @@
 namespace tavrel {
 
 /// Notes an OS update, applies a changed tasking, and submits logs at once for a number of days
-/// after an OS update.
+/// after an OS update. A tasking that preferences could not remember is told to the system log, and
+/// the one applied before stays.
 ///
 /// The daemon's own domain, which remembers what was applied, is synchronised behind all others:
 /// a run that is cut short is repeated as a whole by the next one.

@@ -49,8 +49,8 @@ IterateResult walkChannels(const CountWalk& walk, const plist::Array& channels, 
   return kIterateContinue;
 }
 
-// A callback sees as many channels as the array has when the walk comes to it, also when it files
-// more of them there.
+// A callback sees the channels that the array has when the walk comes to it, not those that it
+// files there itself.
 IterateResult walkChannels(const IterateWalk& walk, const plist::Array& channels,
                            const plist::Array&, plist::Array&) {
   IterateResult result = kIterateContinue;

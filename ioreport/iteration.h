@@ -11,9 +11,10 @@
 // that is nested too deeply or contains itself, and memory that is short end a walk with
 // `kIterateFailed`.
 //
-// A callback may change the channel that it is given, as getters do, but not the arrays and levels
-// of the aggregate, and must not throw. While an aggregate is pruned its arrays have gaps: the
-// callback must not look at it either. A walk without a callback fails.
+// A callback may change the channel that it is given, as getters do. It must not take anything out
+// of the aggregate, nor throw; what it files there meanwhile is not visited in its array and level.
+// While an aggregate is pruned its arrays have gaps: the callback must not even look at it. A walk
+// without a callback fails.
 #pragma once
 
 #include <cstdint>

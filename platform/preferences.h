@@ -4,6 +4,7 @@
 // read are the caller's own.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <string_view>
 
@@ -15,10 +16,15 @@ class Preferences {
  public:
   virtual ~Preferences() = default;
 
+  /// Bytes of a value as XML, with its key: no sender may fill a domain that others share with a
+  /// single value.
+  static constexpr std::size_t kLargestChange = 1U << 20;
+
   /// Null when the key is absent or its domain cannot be read.
   virtual plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) = 0;
 
-  /// Stores `value`; a null value removes the key.
+  /// Stores `value`; a null value removes the key. One that has no form as XML or needs more than
+  /// `kLargestChange` is dropped, with a line in the system log when the domain is synchronised.
   virtual void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                                       std::string_view domain) = 0;
 

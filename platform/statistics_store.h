@@ -16,6 +16,10 @@
 
 namespace tavrel {
 
+/// The preference that counts the stores which were found damaged and set aside.
+inline constexpr std::string_view kStoreCorruptionsDomain = "com.norvane.tallied";
+inline constexpr std::string_view kStoreCorruptionsKey = "DatabaseCorruptionCount";
+
 /// Yields the values of one distribution row in the order in which they were recorded. Values are
 /// fetched from the store in blocks, and only when asked for.
 class BHHistoryDistributionEnumerator {

@@ -78,10 +78,8 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
   // A summary of some of the values would pass for one of all of them.
   if (values.failed()) return;
 
-  if (intervals) {
-    _histogramsOutput.set(forKey, histogram
-                                      ? histogramDictForIntervals(intervals, histogram->counts())
-                                      : plist::Dictionary());
+  if (histogram) {
+    _histogramsOutput.set(forKey, histogramDictForIntervals(intervals, histogram->counts()));
   }
   _distributionsOutput.set(forKey, summary.numbers());
 }

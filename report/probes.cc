@@ -6,6 +6,8 @@
 
 #include "base/arithmetic.h"
 #include "base/bytes.h"
+#include "base/format.h"
+#include "platform/statistics_store.h"
 #include "report/bh_report.h"
 #include "report/faultline_preferences.h"
 
@@ -20,9 +22,6 @@ constexpr std::string_view kUptimeKey = "com.norvane.usage.cur_boot_session_cpu_
 
 constexpr const char* kHomeDirectory = "/var/mobile";
 constexpr std::int64_t kBytesPerMiB = 1048576;
-
-constexpr std::string_view kCorruptionCountPreference = "DatabaseCorruptionCount";
-constexpr std::string_view kCorruptionCountDomain = "com.norvane.tallied";
 
 /// A scalar that is read from a system control: its name, how long its value is in bytes (the
 /// number reported stands in the first eight), and what is reported when it cannot be read.
@@ -98,8 +97,8 @@ std::int64_t BHReport::takeCorruptionCount() {
   if (!findFaultlinePreferences(platform_)) return 0;
   const ProcessState& state = platform_.state;
   const std::int32_t count =
-      lowInt32(state.integerPreferenceGetter(kCorruptionCountPreference, kCorruptionCountDomain));
-  state.preferenceSetter(kCorruptionCountPreference, 0, kCorruptionCountDomain);
+      lowInt32(state.integerPreferenceGetter(kStoreCorruptionsKey, kStoreCorruptionsDomain));
+  state.preferenceSetter(kStoreCorruptionsKey, 0, kStoreCorruptionsDomain);
   return count;
 }
 

@@ -94,8 +94,8 @@ void parseCountersAlgoGenericK4(CounterBlock block, TelemetryCounters& record) {
 }
 
 std::uint32_t chipGeneration(std::string_view chipId) {
-  if (chipId == "K3V") return 1;
-  if (chipId == "K4V") return 2;
+  if (chipId == "K3V") return kGenerationK3;
+  if (chipId == "K4V") return kGenerationK4;
   return 0;
 }
 
@@ -110,8 +110,8 @@ ManufacturerId readManufacturerId(StandardStreams& streams, std::string_view tex
 
 CounterParser selectCounterParser(std::uint32_t generation, std::uint32_t vendor,
                                   std::uint32_t device) {
-  if (generation == 1) return parseCountersAlgoGeneric;
-  if (generation == 2) return parseCountersAlgoGenericK4;
+  if (generation == kGenerationK3) return parseCountersAlgoGeneric;
+  if (generation == kGenerationK4) return parseCountersAlgoGenericK4;
   if (vendor == 0xAD82 && device == 0x52232100) return parseCounters1xHynix;
   if (vendor == 0x4582 && (device == 0x60DE5700 || device == 0x603A5700)) {
     return parseCounters1xSandisk;

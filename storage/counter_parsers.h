@@ -31,7 +31,11 @@ void parseCounters1xHynix(CounterBlock block, TelemetryCounters& record);
 void parseCountersAlgoGeneric(CounterBlock block, TelemetryCounters& record);
 void parseCountersAlgoGenericK4(CounterBlock block, TelemetryCounters& record);
 
-/// Of a controller's "chip-id": 1, 2, or 0 for all others.
+/// Generations of chips with layouts of their own; all others are 0.
+inline constexpr std::uint32_t kGenerationK3 = 1;
+inline constexpr std::uint32_t kGenerationK4 = 2;
+
+/// Of a controller's "chip-id".
 std::uint32_t chipGeneration(std::string_view chipId);
 
 struct ManufacturerId {

@@ -47,13 +47,6 @@ bool fetchOver(UserClient& client, const NandExporter& exporter, StandardStreams
 
 }  // namespace
 
-bool fetchStatisticsFrom(DriverService& service, const NandExporter& exporter,
-                         StandardStreams& streams, ASPContext& context) {
-  return withClient(service, streams, [&](UserClient& client) {
-    return fetchOver(client, exporter, streams, context);
-  });
-}
-
 bool fetchStatistics(DriverRegistry& drivers, StandardStreams& streams,
                      const NandExporter*& exporter, ASPContext& context) {
   const auto service = findNandExporter(drivers, exporter);
@@ -61,7 +54,9 @@ bool fetchStatistics(DriverRegistry& drivers, StandardStreams& streams,
     streams.writeError("Could not get matching Kernkit service for exporting classes\n");
     return false;
   }
-  return fetchStatisticsFrom(*service, *exporter, streams, context);
+  return withClient(*service, streams, [&](UserClient& client) {
+    return fetchOver(client, *exporter, streams, context);
+  });
 }
 
 }  // namespace tavrel

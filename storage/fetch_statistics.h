@@ -15,8 +15,4 @@ namespace tavrel {
 bool fetchStatistics(DriverRegistry& drivers, StandardStreams& streams,
                      const NandExporter*& exporter, ASPContext& context);
 
-/// The same from a service that was found before, in the way of a row.
-bool fetchStatisticsFrom(DriverService& service, const NandExporter& exporter,
-                         StandardStreams& streams, ASPContext& context);
-
 }  // namespace tavrel

@@ -22,14 +22,15 @@ plist::Dictionary CopyNANDInfo(Platform& platform);
 /// be had.
 void DumpNANDInfo(Platform& platform, plist::Dictionary& target);
 
-/// What a parsed buffer says. Without a known export version: the two error keys, or an empty
+/// What a parsed buffer says. Without an export version, or with 0: the two error keys, or an empty
 /// handle in log mode, in which the versions and the demo mode are left out.
 plist::Dictionary buildNANDInfo(Preferences& preferences, const ASPContext& context, bool logMode);
 
 /// Stores an entry, in the place of one with the same key.
 void CopyDictionary(const plist::String& key, const plist::Value& value, plist::Dictionary& target);
 
-/// The low 32 bits of a duration to three significant figures. Halves go up.
+/// The low 32 bits of a duration to three significant figures. Halves go up; a number of three
+/// digits, which would not change, comes out one higher.
 std::int64_t roundMaximumDuration(std::uint64_t value);
 
 }  // namespace tavrel

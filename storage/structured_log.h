@@ -4,8 +4,8 @@
 //
 // Telemetry of the flash channels and the grown defects become structured records. The block
 // validity histogram goes to the NAND log, when writes are amplified beyond a threshold (the
-// preference "userWAmp" of domain "com.norvane.NANDInfo", a real number below 10, else 2.0) or
-// collection is forced.
+// preference "userWAmp" of domain "com.norvane.NANDInfo", a real number above 0 and below 10, else
+// 2.0) or collection is forced.
 #pragma once
 
 #include "platform/platform.h"
@@ -19,7 +19,7 @@ extern double gCurrentUserWamp;
 extern double gCurrentSysWamp;
 /// Set by a client that wants the validity list logged whatever the write amplification is.
 extern bool gForceCollectionSet;
-/// Whether the last run logged the validity list.
+/// Whether the last run was to log the validity list.
 extern bool gNeedValidityList;
 
 /// Fetches and logs every list that the driver offers; true when all that were fetched could be

@@ -25,10 +25,6 @@ constexpr std::int32_t kChipIDBytes = 64;
 constexpr const char* kChannelFields[] = {"RD",  "PE",         "Max_PE_rate", "t0",
                                           "Ret", "block_type", "num_pages"};
 
-// Generations of chips, as `chipGeneration` tells them.
-constexpr std::uint32_t kK3 = 1;
-constexpr std::uint32_t kK4 = 2;
-
 /// What decides how a controller's telemetry is read.
 struct Controller {
   std::uint32_t generation;
@@ -86,17 +82,17 @@ struct ShownArray {
 
 std::vector<ShownArray> shownArrays(std::uint32_t generation) {
   using enum CounterArray;
-  std::vector<ShownArray> shown{{readStage, generation == kK4 ? 33U : 23U},
+  std::vector<ShownArray> shown{{readStage, generation == kGenerationK4 ? 33U : 23U},
                                 {initialReadStage, 23},
                                 {nandStageOfLife, 8},
-                                {dspExceptionParameter, generation == kK4 ? 38U : 12U},
+                                {dspExceptionParameter, generation == kGenerationK4 ? 38U : 12U},
                                 {readStage18NumOfErrorsBin, 12},
                                 {readStage9NumOfErrorsBin, 10},
                                 {readStage10NumOfErrorsBin, 10},
                                 {readStage17NumOfErrorsBin, 10},
                                 {readStage19NumOfErrorsBin, 12}};
-  if (generation == kK3) shown.push_back({algoNANDAccessesBin, 8});
-  if (generation == kK4) shown.push_back({retentionIndication, 12});
+  if (generation == kGenerationK3) shown.push_back({algoNANDAccessesBin, 8});
+  if (generation == kGenerationK4) shown.push_back({retentionIndication, 12});
   return shown;
 }
 

@@ -1,19 +1,26 @@
 #include "tools/input_file.h"
 
+#include <fstream>
 #include <istream>
 #include <iterator>
+#include <sys/stat.h>
 
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/file_layer.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/system_error.h"
 #include "platform/plist/coding.h"
 #include "tools/json_value.h"
 
 namespace tavrel {
 namespace {
 
-Expected<std::string> readStream(std::istream& in, std::size_t largest) {
+Error tooLarge(std::string_view name, std::size_t largest) {
+  return Error{format("%s: more than %zu bytes: give a smaller one", name, largest)};
+}
+
+Expected<std::string> readStream(std::istream& in, std::string_view name, std::size_t largest) {
   std::string bytes;
   constexpr std::size_t kBlock = 64U << 10;
   while (in) {
@@ -21,11 +28,9 @@ Expected<std::string> readStream(std::istream& in, std::size_t largest) {
     bytes.resize(before + kBlock);
     in.read(bytes.data() + before, kBlock);
     bytes.resize(before + static_cast<std::size_t>(in.gcount()));
-    if (bytes.size() > largest) {
-      return Error{format("standard input: more than %zu bytes: give a smaller one", largest)};
-    }
+    if (bytes.size() > largest) return tooLarge(name, largest);
   }
-  if (in.bad()) return Error{"standard input: cannot be read"};
+  if (in.bad()) return Error{format("%s: cannot be read", name)};
   return bytes;
 }
 
@@ -40,7 +45,21 @@ bool looksLikeJson(std::string_view bytes) {
 
 Expected<std::string> readInput(ToolContext& context, const std::string& file,
                                 std::size_t largest) {
-  if (file == "-") return readStream(context.in(), largest);
+  if (file == "-") return readStream(context.in(), "standard input", largest);
+  const auto status = FileLayer::status(file);
+  if (status && S_ISDIR(status->st_mode)) {
+    return Error{
+        format("cannot read %s: it is a folder: give a file, or - for standard input", file)};
+  }
+  // A pipe is what a shell makes of <(command).
+  if (status && !S_ISREG(status->st_mode)) {
+    std::ifstream in(file, std::ios::binary);
+    if (!in) return systemError("read", file);
+    return readStream(in, file, largest);
+  }
+  if (status && static_cast<std::uint64_t>(status->st_size) > largest) {
+    return tooLarge(file, largest);
+  }
   return context.linuxPlatform().fileLayer().read(file, largest);
 }
 

@@ -10,6 +10,7 @@
 #include "platform/linux/device_root.h"
 #include "platform/platform.h"
 #include "storage/counter_parsers.h"
+#include "storage/nand_exporters.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info_keys.h"
 #include "storage/parse/asp_parser.h"
@@ -53,9 +54,14 @@ void info(ToolContext& context) {
     printNandInfo(context.out(), info, context.columns());
   }
   if (!failed) return;
-  context.fail(format("no NAND information: %s: put a recording of the storage driver into %s",
-                      info.string(kNANDInfoErrorMessageKey).value_or(""),
-                      context.root().path("/var/lib/tavrel/registry")));
+  const NandExporter* exporter = nullptr;
+  const bool hasDriver = findNandExporter(noting.platform().drivers, exporter) != nullptr;
+  const std::string advice = hasDriver
+                                 ? "see what the driver answers with 'tavrelctl registry show ID'"
+                                 : format("put a recording of the storage driver into %s",
+                                          context.root().path("/var/lib/tavrel/registry"));
+  context.fail(format("no NAND information: %s: %s",
+                      info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
 }
 
 // A buffer that cannot be parsed is a failure, but what it said until then is still worth showing.
@@ -141,7 +147,8 @@ void snapshot(ToolContext& context, const Arguments& arguments) {
 void freezer(ToolContext& context, const Arguments& arguments) {
   plist::Dictionary info;
   if (arguments.file.empty()) {
-    info = CopyVMFreezerNANDInfo(context.platform().stackSnapshots);
+    NotingPlatform noting(context);
+    info = CopyVMFreezerNANDInfo(noting.platform().stackSnapshots);
   } else {
     const auto bytes = readBuffer(context, arguments.file);
     if (!bytes) return context.fail(bytes.error().message);
@@ -155,7 +162,8 @@ void freezer(ToolContext& context, const Arguments& arguments) {
     printNandInfo(context.out(), info, context.columns());
   }
   if (!failed) return;
-  const std::string message(info.string(kNANDInfoVMFreezerErrorMessageKey).value_or(""));
+  std::string message(info.string(kNANDInfoVMFreezerErrorMessageKey).value_or(""));
+  if (message.ends_with('.')) message.pop_back();
   if (!arguments.file.empty()) {
     return context.fail(
         format("%s: %s: give a stack snapshot whose first container holds the "

@@ -3,6 +3,7 @@
 #include "platform/linux/file_preferences.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded_snapshots.h"
 
 namespace tavrel {
 namespace {
@@ -26,7 +27,9 @@ class NotingLog final : public SystemLog {
 void NotingStreams::writeOutput(std::string_view text) {
   while (text.ends_with('\n'))
     text.remove_suffix(1);
-  if (!text.empty()) context_.note(text);
+  if (text.empty()) return;
+  hasPrinted_ = true;
+  context_.note(text);
 }
 
 struct NotingPlatform::Services {
@@ -35,6 +38,7 @@ struct NotingPlatform::Services {
         log(context),
         streams(context),
         registry(context.root(), context.linuxPlatform().fileLayer(), below.propertyLists, log),
+        snapshots(context.root(), context.linuxPlatform().fileLayer(), log),
         platform{
             .applications = below.applications,
             .clock = below.clock,
@@ -53,7 +57,7 @@ struct NotingPlatform::Services {
             .preferences = context.preferences(),
             .process = below.process,
             .propertyLists = below.propertyLists,
-            .stackSnapshots = below.stackSnapshots,
+            .stackSnapshots = snapshots,
             .standardStreams = streams,
             .statistics = below.statistics,
             .submission = below.submission,
@@ -66,6 +70,7 @@ struct NotingPlatform::Services {
   NotingLog log;
   NotingStreams streams;
   RecordedRegistry registry;
+  RecordedSnapshots snapshots;
   Platform platform;
 };
 
@@ -79,6 +84,10 @@ Platform& NotingPlatform::platform() {
 
 RecordedRegistry& NotingPlatform::registry() {
   return services_->registry;
+}
+
+bool NotingPlatform::hasPrinted() const {
+  return services_->streams.hasPrinted();
 }
 
 bool NotingPlatform::hasErrors() const {

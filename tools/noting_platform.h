@@ -23,10 +23,12 @@ class NotingStreams final : public StandardStreams {
   explicit NotingStreams(ToolContext& context) : context_(context) {}
 
   void writeOutput(std::string_view text) override;
+  bool hasPrinted() const { return hasPrinted_; }
   void writeError(std::string_view text) override { writeOutput(text); }
 
  private:
   ToolContext& context_;
+  bool hasPrinted_ = false;
 };
 
 class NotingPlatform {
@@ -41,6 +43,8 @@ class NotingPlatform {
   RecordedRegistry& registry();
   /// Whether the system has said that something is wrong.
   bool hasErrors() const;
+  /// Whether the system's own operations have printed anything.
+  bool hasPrinted() const;
 
  private:
   struct Services;

@@ -217,7 +217,9 @@ class OverlayCrashReporting final : public CrashReporting {
     events_.tell(OverlayEvent::Kind::CleanUp, "files of old structured records", names);
   }
   void rollNorvaneCareLogs() override {
-    events_.tell(OverlayEvent::Kind::RollOver, "the support log, unless it is empty");
+    events_.tell(OverlayEvent::Kind::RollOver,
+                 below_.hasSupportLog() ? "the support log"
+                                        : "nothing: the support log is empty or not there");
   }
   std::string systemIdentifier() override {
     return told("system identifier", below_.systemIdentifier());

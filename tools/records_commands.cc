@@ -61,8 +61,8 @@ Expected<std::vector<RecordFile>> recordFiles(ToolContext& context, const Select
   return files;
 }
 
-void list(ToolContext& context) {
-  const auto files = recordFiles(context, {});
+void list(ToolContext& context, const Selection& selection) {
+  const auto files = recordFiles(context, selection);
   if (!files) return context.fail(files.error().message);
   constexpr auto kRight = Table::Align::Right;
   Table table({{"TYPE", kRight}, {"DAY"}, {"RECORDS", kRight}, {"BYTES", kRight}});
@@ -189,16 +189,10 @@ class RecordsView {
   bool hasPrinted_ = false;
 };
 
-void show(ToolContext& context, const Arguments& arguments) {
-  Selection selection{arguments.type, std::nullopt};
-  if (!arguments.day.empty()) {
-    const auto day = parseDay(arguments.day, context.platform().statistics.BHDaysSince1970());
-    if (!day) return context.failUsage(day.error().message);
-    selection.day = *day;
-  }
-  RecordsView view(context, selection, arguments.follow);
+void show(ToolContext& context, const Selection& selection, bool follows) {
+  RecordsView view(context, selection, follows);
   view.begin();
-  if (arguments.follow) {
+  if (follows) {
     const Status watched = watchFolder(context.root().path(kRecordFolder), [&] {
       view.look();
       return static_cast<bool>(context.out());
@@ -210,30 +204,52 @@ void show(ToolContext& context, const Arguments& arguments) {
   view.end();
 }
 
+Expected<Selection> selectionOf(ToolContext& context, const Arguments& arguments) {
+  Selection selection{arguments.type, std::nullopt};
+  if (arguments.day.empty()) return selection;
+  const auto day = parseDay(arguments.day, context.platform().statistics.BHDaysSince1970());
+  if (!day) return day.error();
+  selection.day = *day;
+  return selection;
+}
+
+void addSelectionOptions(CLI::App& command, Arguments& arguments) {
+  command
+      .add_option("--type", arguments.type,
+                  "Only those of one type: 172 for ECC events, 176 for telemetry and defects")
+      ->type_name("N");
+  command
+      .add_option("--day", arguments.day,
+                  "Only those of one day: today, yesterday, a day number or YYYY-MM-DD, UTC")
+      ->type_name("DAY");
+}
+
 }  // namespace
 
 void addRecordsCommands(CLI::App& app, ToolContext& context) {
   auto* group = app.add_subcommand("records", "Show structured diagnostic records");
   group->require_subcommand(1);
 
-  auto* listCommand = group->add_subcommand("list", "List the files of records, by day and type");
-  context.addJsonOption(*listCommand);
-  listCommand->callback([&context] { list(context); });
-
   const auto arguments = std::make_shared<Arguments>();
+  auto* listCommand = group->add_subcommand("list", "List the files of records, by day and type");
+  addSelectionOptions(*listCommand, *arguments);
+  context.addJsonOption(*listCommand);
+  listCommand->callback([&context, arguments] {
+    const auto selection = selectionOf(context, *arguments);
+    if (!selection) return context.failUsage(selection.error().message);
+    list(context, *selection);
+  });
+
   auto* showCommand = group->add_subcommand("show", "Show records, oldest day first");
-  showCommand
-      ->add_option("--type", arguments->type,
-                   "Only those of one type: 172 for ECC events, 176 for telemetry and defects")
-      ->type_name("N");
-  showCommand
-      ->add_option("--day", arguments->day,
-                   "Only those of one day: today, yesterday, a day number or YYYY-MM-DD, UTC")
-      ->type_name("DAY");
+  addSelectionOptions(*showCommand, *arguments);
   showCommand->add_flag("-f,--follow", arguments->follow,
                         "Go on with new records until SIGINT or SIGTERM; with --json one a line");
   context.addJsonOption(*showCommand);
-  showCommand->callback([&context, arguments] { show(context, *arguments); });
+  showCommand->callback([&context, arguments] {
+    const auto selection = selectionOf(context, *arguments);
+    if (!selection) return context.failUsage(selection.error().message);
+    show(context, *selection, arguments->follow);
+  });
 }
 
 }  // namespace tavrel

@@ -13,6 +13,7 @@
 #include "platform/linux/recorded_registry.h"
 #include "platform/linux/recording.h"
 #include "platform/plist/xml.h"
+#include "platform/report_protocol.h"
 #include "tools/json_value.h"
 #include "tools/noting_platform.h"
 #include "tools/output_file.h"

@@ -195,6 +195,20 @@ std::string summaryOf(const Totals& totals) {
   return text.empty() ? "nothing" : text;
 }
 
+/// Says that the run would have met errors of the system, which a rehearsal meets the same way.
+void failOnErrors(ToolContext& context, const Rehearsal& rehearsal) {
+  std::uint64_t errors = 0;
+  std::string first;
+  for (const RehearsedStep& step : rehearsal.steps) {
+    for (const OverlayEvent& event : step.events) {
+      if (event.kind != Kind::LogLine || event.subject != "error") continue;
+      if (errors++ == 0) first = event.value.string().value_or("");
+    }
+  }
+  if (errors == 0) return;
+  context.fail(format("the run would log %s; the first: %s", counted(errors, "error"), first));
+}
+
 std::string_view nameOf(RehearsedRun run) {
   constexpr std::string_view kNames[] = {"gated", "forced", "today"};
   return kNames[static_cast<std::size_t>(run)];
@@ -256,8 +270,12 @@ void addRehearseCommand(CLI::App& app, ToolContext& context) {
                              : arguments->forced ? RehearsedRun::Forced
                                                  : RehearsedRun::Gated;
     const Rehearsal rehearsal = rehearse(context.linuxPlatform(), run);
-    if (context.json()) return context.printJson(documentOf(rehearsal, run));
-    print(context, rehearsal, run, arguments->verbose);
+    if (context.json()) {
+      context.printJson(documentOf(rehearsal, run));
+    } else {
+      print(context, rehearsal, run, arguments->verbose);
+    }
+    failOnErrors(context, rehearsal);
   });
 }
 

@@ -1,15 +1,19 @@
 #include "tools/report_commands.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <charconv>
 #include <chrono>
 #include <memory>
 #include <ostream>
+#include <string_view>
 #include <thread>
+#include <utility>
 
 #include "base/format.h"
 #include "ioreport/ioreport.h"
 #include "tools/noting_platform.h"
+#include "tools/report_delta.h"
 #include "tools/report_json.h"
 #include "tools/report_selection.h"
 #include "tools/report_view.h"
@@ -20,6 +24,9 @@ namespace {
 
 constexpr double kLongestInterval = 86'400;  // seconds
 
+constexpr std::string_view kNoHub =
+    "there is no hub: a recording in /var/lib/tavrel/registry must have a \"Hub\"";
+
 struct Arguments {
   ReportSelection selection;
   bool flat = false;
@@ -29,13 +36,24 @@ struct Arguments {
   bool channelsOnly = false;
 };
 
+Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
+                                             const ReportSelection& selection) {
+  auto channels = selectChannels(noting.platform(), selection);
+  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
+  // Of a driver whose channels cannot be read the notes have the library's words only.
+  if (channels && noting.hasPrinted()) {
+    context.note("such drivers are left out: 'tavrelctl registry show ID' shows what they publish");
+  }
+  return channels;
+}
+
 // The selected channels and the connection that samples them.
 class Sampler {
  public:
   /// Says what is wrong when it cannot subscribe.
   Sampler(ToolContext& context, const ReportSelection& selection)
       : context_(context), noting_(context) {
-    const auto selected = selectChannels(noting_.platform(), selection);
+    const auto selected = selectedChannels(context, noting_, selection);
     if (!selected) {
       context.fail(selected.error().message);
       return;
@@ -47,7 +65,10 @@ class Sampler {
     std::optional<ErrorObject> error;
     subscription_ = IOReportCreateSubscription(noting_.platform().drivers, nullptr, *selected,
                                                &subscribed_, 0, &error);
-    if (!subscription_) context.fail(reportFailure("subscribe to the channels", error));
+    if (subscription_) return;
+    const bool isHubMissing = error && error->code == kKernelNotFound && !reasonOf(error);
+    context.fail(
+        reportFailure("subscribe to the channels", error, isHubMissing ? kNoHub : kLookAtDrivers));
   }
 
   explicit operator bool() const { return subscription_ != nullptr; }
@@ -74,9 +95,8 @@ class Sampler {
 
 void list(ToolContext& context, const Arguments& arguments) {
   NotingPlatform noting(context);
-  const auto channels = selectChannels(noting.platform(), arguments.selection);
+  const auto channels = selectedChannels(context, noting, arguments.selection);
   if (!channels) return context.fail(channels.error().message);
-  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
   if (context.json()) return context.printJson({{"channels", channelsJson(*channels)}});
   if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
   printChannels(context.out(), *channels, arguments.flat, context.columns());
@@ -105,11 +125,34 @@ void printOne(ToolContext& context, const Arguments& arguments, const plist::Dic
   context.out().flush();
 }
 
+// Deltas, without the channels that have none. A note names the first of them whenever their number
+// changes.
+class Changes {
+ public:
+  explicit Changes(ToolContext& context) : context_(context) {}
+
+  plist::Dictionary between(const plist::Dictionary& previous, const plist::Dictionary& current) {
+    PartialDelta delta;
+    delta.samples = IOReportCreateSamplesDelta(previous, current, nullptr);
+    if (!delta.samples) delta = subtractEach(previous, current);
+    if (delta.leftOut != std::exchange(leftOut_, delta.leftOut) && delta.leftOut > 0) {
+      context_.note(format("%s without a change that can be told, left out; the first is %s",
+                           counted(delta.leftOut, "channel"), delta.firstLeftOut));
+    }
+    return delta.samples;
+  }
+
+ private:
+  ToolContext& context_;
+  std::size_t leftOut_ = 0;
+};
+
 void sample(ToolContext& context, const Arguments& arguments) {
   Sampler sampler(context, arguments.selection);
   if (!sampler) return;
   const std::chrono::duration<double> interval(arguments.interval);
   plist::Dictionary previous;
+  Changes changes(context);
   std::int32_t reported = 0;
   for (std::uint32_t number = arguments.delta ? 0 : 1; number <= arguments.count; ++number) {
     if (number > (arguments.delta ? 0U : 1U)) std::this_thread::sleep_for(interval);
@@ -121,13 +164,9 @@ void sample(ToolContext& context, const Arguments& arguments) {
                           counted(static_cast<std::uint64_t>(missing), "channel")));
       reported = missing;
     }
-    plist::Dictionary shown = samples;
-    if (previous) {
-      std::optional<ErrorObject> error;
-      shown = IOReportCreateSamplesDelta(previous, samples, &error);
-      if (!shown) return context.fail(reportFailure("subtract the samples", error));
-    }
+    const plist::Dictionary shown = previous ? changes.between(previous, samples) : samples;
     if (number > 0) printOne(context, arguments, shown, number, missing);
+    if (!context.out()) return;
     if (arguments.delta) previous = samples;
   }
 }
@@ -135,14 +174,19 @@ void sample(ToolContext& context, const Arguments& arguments) {
 // The system's own words. Some of them have no line end.
 void print(ToolContext& context, const std::optional<std::string>& description) {
   if (!description) return;
-  context.out() << *description;
-  if (!description->ends_with('\n')) context.out() << '\n';
+  // Names come from drivers: what would steer a terminal is shown, but not the lines' own ends.
+  std::string_view rest = *description;
+  while (!rest.empty()) {
+    const std::size_t end = std::min(rest.find('\n'), rest.size());
+    context.out() << printable(rest.substr(0, end)) << '\n';
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+  }
 }
 
 void describe(ToolContext& context, const Arguments& arguments) {
   if (arguments.channelsOnly) {
     NotingPlatform noting(context);
-    const auto channels = selectChannels(noting.platform(), arguments.selection);
+    const auto channels = selectedChannels(context, noting, arguments.selection);
     if (!channels) return context.fail(channels.error().message);
     for (const plist::Dictionary& channel : channelsIn(*channels))
       print(context, IOReportChannelCopyDescription(channel, 0, nullptr));

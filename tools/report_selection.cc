@@ -109,7 +109,11 @@ Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelec
   const auto channels = IOReportCopyAllChannels(
       platform.drivers, platform.standardStreams,
       kOptionGroupByDriver | kOptionGroupByGroup | kOptionPrintErrors, &error);
-  if (!channels) return Error{reportFailure("list the channels", error)};
+  if (!channels) {
+    return Error{error ? reportFailure("list the channels", error)
+                       : reportFailure("list the channels", error,
+                                       "the registry may have changed meanwhile: try again")};
+  }
   const bool byGroup = !selection.group.empty() || !selection.subGroup.empty();
   if (byGroup && walkFailed(IOReportSelectChannelsInGroup(channels, given(selection.group),
                                                           given(selection.subGroup), &error))) {
@@ -131,24 +135,25 @@ std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate) {
   return channels;
 }
 
-std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error) {
-  const KernelReturn code = error ? error->code : kKernelError;
-  std::string reason;
-  // A failure without words of its own is told by its code.
-  if (error && error->failureReason != createCFErr(code, nullptr)->failureReason) {
-    reason = ": " + printable(error->failureReason.value_or(error->description()));
+std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error) {
+  // A failure without words of its own has those of its code.
+  if (!error || error->failureReason == createCFErr(error->code, nullptr)->failureReason) {
+    return std::nullopt;
   }
-  std::string_view advice = "'tavrelctl registry list' shows the drivers and the hub";
-  if (code == kKernelNotFound) {
-    advice = "there is no hub: a recording in /var/lib/tavrel/registry must have a \"Hub\"";
-  } else if (code == kKernelAborted) {
-    advice = "the registry changed meanwhile: try again";
-  }
-  return format("cannot %s%s (%#x): %s", what, reason, code, advice);
+  return error->failureReason.value_or(error->description());
 }
 
-std::string_view formatName(std::uint8_t format) {
-  return format < std::size(kFormatNames) ? kFormatNames[format] : kFormatNames[0];
+std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
+                          std::string_view advice) {
+  std::string line = "cannot " + std::string(what);
+  if (const auto reason = reasonOf(error)) line += ": " + printable(*reason);
+  if (error) line += format(" (%#x)", error->code);
+  return line + ": " + std::string(advice);
+}
+
+std::string formatName(std::uint8_t format) {
+  return format < std::size(kFormatNames) ? std::string(kFormatNames[format])
+                                          : std::to_string(format);
 }
 
 std::optional<std::uint64_t> parseWord(std::string_view text) {

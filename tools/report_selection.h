@@ -34,11 +34,18 @@ Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelec
 /// All channels of an aggregate, in its order.
 std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);
 
-/// "cannot WHAT: REASON (0xE00002F0): WHAT TO DO".
-std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error);
+inline constexpr std::string_view kLookAtDrivers =
+    "'tavrelctl registry list' shows the drivers and the hub";
 
-/// "simple", "state", "histogram", "array" or "unknown".
-std::string_view formatName(std::uint8_t format);
+/// The words of an error that has some besides its code.
+std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error);
+
+/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without what is not known.
+std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
+                          std::string_view advice = kLookAtDrivers);
+
+/// "simple", "state", "histogram", "array", "unknown" or the number of another format.
+std::string formatName(std::uint8_t format);
 
 /// A number of at most 64 bits, decimal or with 0x.
 std::optional<std::uint64_t> parseWord(std::string_view text);

@@ -19,7 +19,6 @@ namespace {
 
 constexpr std::size_t kBarWidth = 24;
 constexpr std::uint64_t kBarSteps = 1000;  // of a whole
-constexpr std::int32_t kArrayColumns = 4;  // the values of an element
 
 std::string textOr(std::optional<std::string_view> text, std::string_view otherwise) {
   return std::string(text.value_or(otherwise));
@@ -75,9 +74,9 @@ class Place {
 std::vector<std::string> cellsOf(const plist::Dictionary& channel) {
   std::uint64_t type = 0;
   const bool hasType = getChannelType(channel, type) == kKernelSuccess;
-  return {std::string(formatName(IOReportChannelGetFormat(channel))),
+  return {formatName(IOReportChannelGetFormat(channel)),
           textOr(IOReportChannelGetUnitLabel(channel), ""),
-          format("%#06x", IOReportChannelGetCategories(channel)),
+          format("0x%04x", IOReportChannelGetCategories(channel)),
           hasType ? std::to_string(elementCountOf(type)) : "-",
           format("%#llx", IOReportChannelGetChannelID(channel))};
 }
@@ -215,11 +214,12 @@ class SamplePrinter {
   }
 
   void printArray(const plist::Dictionary& channel) {
-    std::uint64_t type = 0;
-    getChannelType(channel, type);
+    const Elements elements = getRawElements(channel, kFormatSimpleArray);
+    const auto count = static_cast<std::int32_t>(kElementValues * elements.count());
+    constexpr auto kColumns = static_cast<std::int32_t>(kElementValues);
     Rows rows;
-    for (std::int32_t i = 0; i < kArrayColumns * elementCountOf(type); ++i) {
-      if (i % kArrayColumns == 0) rows.push_back({format("[%d]", i)});
+    for (std::int32_t i = 0; i < count; ++i) {
+      if (i % kColumns == 0) rows.push_back({format("[%d]", i)});
       rows.back().push_back(signedText(IOReportArrayGetValueAtIndex(channel, i)));
     }
     constexpr auto kRight = Table::Align::Right;

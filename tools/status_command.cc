@@ -20,6 +20,7 @@ namespace {
 struct DeviceStatus {
   std::optional<bool> submissionAllowed;  // nothing when preferences cannot be read
   std::int32_t today = 0;
+  bool isStateReadable = true;           // the daemon's own preferences
   std::optional<std::int32_t> lastDay;   // of the gated run
   std::optional<std::string> osVersion;  // of the last log
   std::string storePath;
@@ -41,7 +42,8 @@ DeviceStatus takeStatus(ToolContext& context) {
   DeviceStatus status;
   const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
       "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
-  if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
+  const bool isUnknown = context.hasComplaints();
+  if (!isUnknown) status.submissionAllowed = isAllowed;
   status.today = platform.statistics.BHDaysSince1970();
   bool hasRun = false;
   const auto lastDay =
@@ -51,6 +53,7 @@ DeviceStatus takeStatus(ToolContext& context) {
           context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
     status.osVersion = *version;
   }
+  status.isStateReadable = isUnknown || !context.hasComplaints();
   status.storePath = context.storeForReading().path();
   status.storeBytes = bytesOfStore(status.storePath);
   if (status.storeBytes) {
@@ -103,14 +106,15 @@ std::string storeText(const DeviceStatus& status) {
 
 void printText(ToolContext& context, const DeviceStatus& status) {
   Table table({{""}, {""}});
+  const char* const none = status.isStateReadable ? "none yet" : "unknown";
   table.add({"Submission", !status.submissionAllowed ? "unknown"
                            : *status.submissionAllowed
                                ? "allowed"
                                : "not allowed (allow it with: tavrelctl prefs set "
                                  "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)"});
   table.add({"Today", dayText(status.today)});
-  table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : "none yet"});
-  table.add({"Last OS version", status.osVersion.value_or("none yet")});
+  table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
+  table.add({"Last OS version", status.osVersion.value_or(none)});
   table.add({"Store", storeText(status)});
   table.add({"Store file", status.storePath});
   table.add(

@@ -104,7 +104,8 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
 
 void show(ToolContext& context) {
   const Taskings taskings(context);
-  if (context.hasComplaints()) context.setExitStatus(kExitFailure);
+  // What cannot be read must not look like what is not there.
+  if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   if (context.json()) {
     const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);
     context.printJson({{"scheduled", json(taskings.scheduled)},
@@ -156,6 +157,7 @@ void schedule(ToolContext& context, const std::string& path) {
 
 void clear(ToolContext& context) {
   const Taskings taskings(context);
+  if (!taskings.document && context.hasComplaints()) return context.setExitStatus(kExitFailure);
   if (!taskings.document) {
     context.out() << "No tasking is scheduled.\n";
     return;

@@ -23,14 +23,21 @@
 namespace tavrel {
 namespace {
 
-// The subcommand that was being parsed, as it is typed.
-std::string commandLineOf(const CLI::App& app) {
+// What is wrong with a line, and the help of the subcommand that was being parsed.
+std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
+  const CLI::App* command = &app;
   std::string line = app.get_name();
-  for (const CLI::App* command = &app; !command->get_subcommands().empty();) {
+  while (!command->get_subcommands().empty()) {
     command = command->get_subcommands().front();
     line += ' ' + command->get_name();
   }
-  return line;
+  std::string fault = error.what();
+  const auto unknown = app.remaining(true);
+  if (dynamic_cast<const CLI::RequiredError*>(&error) != nullptr && !unknown.empty() &&
+      command->get_require_subcommand_min() > 0) {
+    fault = format("no subcommand '%s'", unknown.front());
+  }
+  return format("%s: see '%s --help'", fault, line);
 }
 
 void addGlobalOptions(CLI::App& app, ToolContext& context) {
@@ -72,7 +79,7 @@ void run(const std::vector<std::string>& arguments, ToolContext& context) {
     if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
       app.exit(error, context.out(), context.error());
     } else {
-      context.failUsage(format("%s: see '%s --help'", error.what(), commandLineOf(app)));
+      context.failUsage(usageFault(app, error));
     }
   }
 }

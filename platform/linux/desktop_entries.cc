@@ -8,6 +8,7 @@
 #include <unordered_set>
 #include <vector>
 
+#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/line_reader.h"
 
@@ -23,17 +24,30 @@ struct DataFolder {
   std::string_view bundleType;
 };
 
+// A user may put a link in the place of a folder, and it may lead anywhere.
+bool hasLink(std::string folder) {
+  std::error_code ignored;
+  for (const char* const name : {"/.local", "/share", "/applications"}) {
+    folder += name;
+    if (fs::is_symlink(folder, ignored)) return true;
+  }
+  return false;
+}
+
 std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
   std::vector<DataFolder> folders;
+  const auto addHome = [&](const std::string& home) {
+    if (!hasLink(home)) folders.push_back({home + "/.local/share", PWUserApplicationType});
+  };
   std::error_code error;
   for (fs::directory_iterator at(root.path("/home"), error), end; !error && at != end;
        at.increment(error)) {
-    folders.push_back({at->path().string() + "/.local/share", PWUserApplicationType});
+    addHome(at->path().string());
   }
   std::sort(folders.begin(), folders.end(),
             [](const DataFolder& a, const DataFolder& b) { return a.path < b.path; });
-  for (const auto path :
-       {"/root/.local/share", "/var/lib/flatpak/exports/share", "/usr/local/share"}) {
+  addHome(root.path("/root"));
+  for (const auto path : {"/var/lib/flatpak/exports/share", "/usr/local/share"}) {
     folders.push_back({root.path(path), PWUserApplicationType});
   }
   folders.push_back({root.path("/usr/share"), kSystemApplicationType});
@@ -41,7 +55,7 @@ std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
 }
 
 bool isApplication(const std::string& path) {
-  LineReader lines(path);
+  LineReader lines(path, limits::kDesktopEntryBytes);
   bool inEntry = false;
   bool application = false;
   while (const auto line = lines.next()) {
@@ -52,9 +66,7 @@ bool isApplication(const std::string& path) {
     const std::size_t equals = line->find('=');
     if (!inEntry || line->starts_with('#') || equals == std::string_view::npos) continue;
     const std::string_view key = line->substr(0, line->find_last_not_of(" \t", equals - 1) + 1);
-    std::string_view value = line->substr(equals + 1);
-    value.remove_prefix(std::min(value.find_first_not_of(" \t"), value.size()));
-    value = value.substr(0, value.find_last_not_of(" \t\r") + 1);
+    const std::string_view value = trimmed(line->substr(equals + 1));
     if (key == "Type") application = value == "Application";
     if ((key == "NoDisplay" || key == "Hidden") && value == "true") return false;
   }
@@ -65,13 +77,20 @@ bool isApplication(const std::string& path) {
 
 void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
                              const std::function<void(const PWBundleProxy&)>& handler) {
-  std::unordered_set<std::string> seen;
+  std::unordered_set<std::string, KeyedHash> seen;
+  std::size_t visited = 0;
   for (const DataFolder& folder : dataFolders(root)) {
     const std::string top = folder.path + std::string(kApplicationsFolder);
     std::error_code error;
     fs::recursive_directory_iterator at(top, fs::directory_options::skip_permission_denied, error);
     for (; !error && at != fs::recursive_directory_iterator(); at.increment(error)) {
       const std::string path = at->path().string();
+      if (++visited > limits::kDesktopFiles) {
+        log.log(LogLevel::Error,
+                "more than %zu files beside the desktop entries; those from %s on do not count",
+                limits::kDesktopFiles, path);
+        return;
+      }
       if (!path.ends_with(".desktop")) continue;
       std::string identifier = path.substr(top.size() + 1);
       std::replace(identifier.begin(), identifier.end(), '/', '-');

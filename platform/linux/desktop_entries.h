@@ -9,6 +9,9 @@
 //   /var/lib/flatpak/exports/share, /usr/local/share
 //   /usr/share                                  the system's
 //
+// A folder of a user that is a symbolic link is passed over, and so is an entry larger than
+// `limits::kDesktopEntryBytes`. The walk ends after `limits::kDesktopFiles` files and folders.
+//
 // Applications of all but the last count as installed by the user.
 #pragma once
 

@@ -10,6 +10,7 @@
 #include "base/bytes.h"
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/uuid.h"
 #include "platform/linux/property_list_file.h"
 
 namespace tavrel {
@@ -18,9 +19,15 @@ namespace {
 constexpr std::string_view kFolder = "/var/lib/tavrel/ecc-events";
 constexpr std::string_view kCounters = "/var/lib/tavrel/edac-counters.plist";
 constexpr std::string_view kControllers = "/sys/devices/system/edac/mc";
+constexpr std::string_view kBootIDFile = "/proc/sys/kernel/random/boot_id";
 constexpr std::string_view kEventEnding = ".event";
 constexpr std::string_view kErrorEnding = ".errno";
 constexpr mode_t kMode = 0640;
+
+/// What is remembered beside the counters: the boot that they are of, and its number among the
+/// boots that were seen.
+constexpr std::string_view kBootIDKey = "BootID";
+constexpr std::string_view kBootNumberKey = "BootNumber";
 
 /// The largest number that the kernel uses for an error.
 constexpr std::uint64_t kLargestErrorNumber = 4095;
@@ -31,9 +38,13 @@ struct CountedError {
 };
 constexpr CountedError kCountedErrors[] = {{1, "ce_count"}, {2, "ue_count"}};
 
+std::string_view withoutLineEnd(std::string_view text) {
+  return text.substr(0, text.size() - (text.ends_with('\n') ? 1 : 0));
+}
+
 /// A decimal number, with or without a line end.
 std::optional<std::uint64_t> numberIn(std::string_view text) {
-  if (text.ends_with('\n')) text.remove_suffix(1);
+  text = withoutLineEnd(text);
   std::uint64_t number = 0;
   const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), number);
   if (fault != std::errc{} || end != text.data() + text.size() || text.empty()) return std::nullopt;
@@ -82,10 +93,8 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
     const int error = content && !isEvent ? errorNumberIn(**content) : 0;
     const bool isUsable = content && (isEvent ? (*content)->size() == kEccEventBytes : error != 0);
     if (!isUsable) {
-      log_.log(LogLevel::Error, "%s: %s; it is set aside", path,
-               content ? "it is neither an event of 72 bytes nor an error number"
-                       : content.error().message);
-      if (mode_ == Mode::Consume) (void)files_.rename(path, path + ".unusable");
+      setAside(path, content ? "it is neither an event of 72 bytes nor an error number"
+                             : content.error().message);
       continue;
     }
     if (mode_ == Mode::Consume) {
@@ -99,6 +108,15 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
     return give(**content, buffer);
   }
   return {ENOENT, 0};
+}
+
+void EccEvents::setAside(const std::string& path, std::string_view fault) {
+  std::string outcome = "it would be set aside";
+  if (mode_ == Mode::Consume) {
+    const Status moved = files_.rename(path, path + ".unusable");
+    outcome = moved ? "it is set aside" : moved.error().message;
+  }
+  log_.log(LogLevel::Error, "%s: %s; %s", path, fault, outcome);
 }
 
 void EccEvents::fill() {
@@ -151,6 +169,16 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
   const std::string folder = root_.pathOrMachine(kControllers);
   const auto controllers = files_.list(folder);
   if (!controllers) return events;
+  const std::string bootID = bootIDBeside(folder);
+  const auto lastBoot = counted.number(kBootNumberKey);
+  std::uint64_t boot = lastBoot ? static_cast<std::uint64_t>(lastBoot->int64()) : 0;
+  if (!bootID.empty() && counted.string(kBootIDKey) != bootID) {
+    ++boot;
+    // Without an id it was remembered before boots were: in this one, as far as is known.
+    if (counted.contains(kBootIDKey)) counted = {{kBootNumberKey, boot}};
+  }
+  // Boots in their order, and those that were never remembered apart.
+  const std::string prefix = bootID.empty() ? "" : format("%010llu-%s-", boot, bootID.substr(0, 8));
   for (const std::string& controller : *controllers) {
     const auto number =
         controller.starts_with("mc") ? numberIn(controller.substr(2)) : std::nullopt;
@@ -162,16 +190,29 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
       if (!count) continue;
       const auto before = counted.number(file);
       counted.set(file, *count);
-      // The kernel counts from 0 after each start. What the first look finds was counted before
+      // One that has gone back was started anew. What the first look finds was counted before
       // anybody asked, and counts as new.
       const std::uint64_t last = before ? static_cast<std::uint64_t>(before->int64()) : 0;
       const std::uint64_t fresh = *count >= last ? *count - last : *count;
       if (fresh == 0) continue;
-      events.push_back({format("edac-%s-%s-%020llu%s", controller, kind.file, *count, kEventEnding),
-                        eventOf(kind.eventID, {*number, fresh, *count})});
+      events.push_back(
+          {format("edac-%s-%s-%s%020llu%s", controller, kind.file, prefix, *count, kEventEnding),
+           eventOf(kind.eventID, {*number, fresh, *count})});
     }
   }
+  if (!bootID.empty() && !counted.empty()) {
+    counted.set(kBootIDKey, bootID);
+    counted.set(kBootNumberKey, boot);
+  }
   return events;
+}
+
+std::string EccEvents::bootIDBeside(const std::string& controllers) {
+  const bool isOfRoot = controllers == root_.path(kControllers);
+  const std::string path = isOfRoot ? root_.path(kBootIDFile) : std::string(kBootIDFile);
+  const auto content = files_.readIfPresent(path, limits::kSystemFactBytes);
+  if (!content || !*content) return {};
+  return normalisedUuid(withoutLineEnd(**content)).value_or("");
 }
 
 }  // namespace tavrel

@@ -9,12 +9,14 @@
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
 // identifier 1 for corrected and 2 for uncorrected errors, with the number of the memory
 // controller, the new errors and all errors since the machine started as registers. What was seen
-// is remembered in /var/lib/tavrel/edac-counters.plist.
+// is remembered in /var/lib/tavrel/edac-counters.plist, with the boot in which it was: in another
+// boot the kernel counts from 0.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "base/plist.h"
@@ -48,12 +50,17 @@ class EccEvents {
   };
 
   void fill();
+  /// Moves an unusable file out of the way, or says that it would.
+  void setAside(const std::string& path, std::string_view fault);
   /// What had been counted at the last look; of a controller that is gone, the last that was told.
   plist::Dictionary seenErrors();
   /// Writes events for what was counted since the last look, and remembers it.
   void publishCountedErrors();
   /// The events for what was counted beyond `counted`, which is brought up to date.
   std::vector<Event> newErrors(plist::Dictionary& counted);
+  /// The id of the boot in which the controllers of that folder count: a root that has controllers
+  /// of its own has the machine's boots as little as its errors. Empty when it is not told.
+  std::string bootIDBeside(const std::string& controllers);
 
   const DeviceRoot& root_;
   FileLayer& files_;

@@ -6,8 +6,8 @@
 
 #include "base/limits.h"
 #include "base/uuid.h"
+#include "platform/guarded.h"
 #include "platform/linux/digests.h"
-#include "platform/linux/guarded_end.h"
 #include "platform/linux/json_line.h"
 #include "platform/linux/random.h"
 #include "platform/linux/record_files.h"
@@ -27,7 +27,7 @@ bool isFilled(const std::string& path) {
 }  // namespace
 
 FileCrashReporting::~FileCrashReporting() {
-  endGuarded(log_, "flush structured records", [this] { flushRecords(); });
+  runGuarded(log_, "flush structured records", [this] { flushRecords(); });
 }
 
 void FileCrashReporting::FLLogStructuredData(std::uint32_t logType,
@@ -108,11 +108,15 @@ void FileCrashReporting::flushRecords() {
   recordFiles_.clear();
 }
 
+bool FileCrashReporting::hasSupportLog() {
+  return isFilled(root_.path(kSupportLog));
+}
+
 // Only the logs below the first free number move. So a roll that was cut short, which leaves such a
 // gap, is taken up again by the next one and costs no log.
 void FileCrashReporting::rollNorvaneCareLogs() {
+  if (!hasSupportLog()) return;
   const std::string log = root_.path(kSupportLog);
-  if (!isFilled(log)) return;
   const auto numbered = [&](int number) {
     return number == 0 ? log : log + "." + std::to_string(number);
   };

@@ -42,6 +42,9 @@ class FileCrashReporting final : public CrashReporting {
   /// The files that the clean-up removes, without their folder.
   std::vector<std::string> oldRecordFiles();
 
+  /// Whether there is a support log with something in it, which is what rolls.
+  bool hasSupportLog();
+
   /// Derived from the machine's identifier, which itself never leaves the device: a UUID that is
   /// the same at every call; "unknown" on a machine without one.
   std::string systemIdentifier() override;

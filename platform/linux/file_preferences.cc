@@ -5,7 +5,7 @@
 
 #include "base/limits.h"
 #include "base/text.h"
-#include "platform/linux/guarded_end.h"
+#include "platform/guarded.h"
 #include "platform/linux/random.h"
 #include "platform/linux/stamp.h"
 
@@ -16,8 +16,7 @@ constexpr std::string_view kFolder = "/var/mobile/Library/Preferences";
 constexpr std::string_view kEnding = ".plist";
 constexpr mode_t kMode = 0644;
 
-/// Bytes of one change as XML: no sender may fill a domain that others share with a single value.
-constexpr std::size_t kLargestChange = limits::kPreferenceFileBytes / 8;
+static_assert(Preferences::kLargestChange <= limits::kPreferenceFileBytes / 8);
 
 std::string quoted(std::string_view text) {
   std::string out;
@@ -37,7 +36,7 @@ FilePreferences::FilePreferences(const DeviceRoot& root, FileLayer& files,
 
 FilePreferences::~FilePreferences() {
   for (auto& entry : domains_) {
-    endGuarded(log_, "write the last preferences", [&] { synchronize(entry.second, entry.first); });
+    runGuarded(log_, "write the last preferences", [&] { synchronize(entry.second, entry.first); });
   }
 }
 

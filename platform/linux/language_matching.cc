@@ -9,6 +9,7 @@
 #include <unordered_set>
 #include <utility>
 
+#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/language_tables.h"
 #include "platform/linux/language_tag.h"
@@ -53,7 +54,7 @@ std::vector<std::optional<LanguageTag>> parseTags(const std::vector<std::string>
   std::vector<std::optional<LanguageTag>> tags;
   const std::size_t count = std::min(names.size(), limits::kLanguages);
   tags.reserve(count);
-  std::unordered_set<std::string_view> seen;
+  std::unordered_set<std::string_view, KeyedHash> seen;
   for (std::size_t i = 0; i < count; ++i) {
     tags.push_back(seen.insert(names[i]).second ? parseLanguageTag(names[i]) : std::nullopt);
   }

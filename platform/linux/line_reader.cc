@@ -1,5 +1,6 @@
 #include "platform/linux/line_reader.h"
 
+#include <algorithm>
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
@@ -11,7 +12,14 @@
 
 namespace tavrel {
 
-LineReader::LineReader(const std::string& path) {
+std::string_view trimmed(std::string_view text) {
+  constexpr std::string_view kBlank = " \t\r";
+  const std::size_t first = text.find_first_not_of(kBlank);
+  if (first == std::string_view::npos) return {};
+  return text.substr(first, text.find_last_not_of(kBlank) - first + 1);
+}
+
+LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
   // Opening a pipe that nobody writes to would otherwise wait for a writer.
   descriptor_ = Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat status {};
@@ -19,6 +27,8 @@ LineReader::LineReader(const std::string& path) {
     errorNumber_ = errno;
   } else if (!S_ISREG(status.st_mode)) {
     errorNumber_ = EINVAL;
+  } else if (static_cast<std::uint64_t>(status.st_size) > largest) {
+    errorNumber_ = EFBIG;
   } else {
     buffer_ = std::make_unique_for_overwrite<char[]>(limits::kTextLineBytes);
   }
@@ -51,13 +61,16 @@ bool LineReader::fill() {
   std::memmove(buffer_.get(), buffer_.get() + begin_, end_ - begin_);
   end_ -= begin_;
   begin_ = 0;
+  const std::size_t room =
+      static_cast<std::size_t>(std::min<std::uint64_t>(limits::kTextLineBytes - end_, left_));
   ssize_t count = 0;
   do {
-    count = read(descriptor_.get(), buffer_.get() + end_, limits::kTextLineBytes - end_);
+    count = read(descriptor_.get(), buffer_.get() + end_, room);
   } while (count < 0 && errno == EINTR);
   if (count < 0) errorNumber_ = errno;
   if (count <= 0) return false;
   end_ += static_cast<std::size_t>(count);
+  left_ -= static_cast<std::uint64_t>(count);
   return true;
 }
 

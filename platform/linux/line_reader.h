@@ -6,6 +6,7 @@
 #pragma once
 
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -15,10 +16,14 @@
 
 namespace tavrel {
 
+/// A line, or a part of it, without spaces, tabs and carriage returns at its ends.
+std::string_view trimmed(std::string_view text);
+
 class LineReader {
  public:
-  /// Only regular files are read; a folder, a pipe or a device fails with EINVAL.
-  explicit LineReader(const std::string& path);
+  /// Only regular files are read; a folder, a pipe or a device fails with EINVAL, a file of more
+  /// than `largest` bytes with EFBIG.
+  explicit LineReader(const std::string& path, std::uint64_t largest = UINT64_MAX);
 
   /// The next line without its end, valid until the next call. A line that is longer than
   /// `limits::kTextLineBytes` is cut. Nothing at the end of the file and after a failure.
@@ -32,6 +37,7 @@ class LineReader {
 
   Descriptor descriptor_;
   int errorNumber_ = 0;
+  std::uint64_t left_;  // bytes that may still be read, should the file grow
   std::unique_ptr<char[]> buffer_;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;

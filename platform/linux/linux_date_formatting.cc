@@ -1,6 +1,5 @@
 #include "platform/linux/linux_date_formatting.h"
 
-#include <cmath>
 #include <cstdint>
 #include <cstdlib>
 #include <ctime>
@@ -8,6 +7,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "platform/linux/stamp.h"
 
 namespace tavrel {
 namespace {
@@ -31,7 +31,7 @@ std::int64_t yearOfEra(std::int64_t year) {
 
 std::string LinuxDateFormatting::format(plist::Date date, std::string_view pattern,
                                         std::string_view) {
-  const std::int64_t instant = saturatingInt64(std::floor(date.secondsSince1970()));
+  const std::int64_t instant = wholeSeconds(date);
   const std::int64_t offset = offsetAt(instant, root_.pathOrMachine("/etc/localtime"));
   const CivilTime time = civilFromSeconds(wrappingAdd(instant, offset));
 

@@ -26,14 +26,6 @@ constexpr std::string_view kGeneratedLocalesFolder = "/usr/lib/locale";
 /// The language of texts that nobody translated.
 constexpr std::string_view kUntranslated = "en";
 
-constexpr std::string_view kBlank = " \t\r";
-
-std::string_view trimmed(std::string_view text) {
-  const std::size_t first = text.find_first_not_of(kBlank);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(kBlank) - first + 1);
-}
-
 /// The value of an assignment, without quotation marks or what stands behind it.
 std::string_view unquoted(std::string_view value) {
   if (value.starts_with('"') || value.starts_with('\'')) {
@@ -141,7 +133,7 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
 
   std::vector<std::string> generated;
   readLines(kGeneratedLocalesFile, [&](std::string_view line) {
-    generated.emplace_back(line.substr(0, line.find_first_of(kBlank)));
+    generated.emplace_back(line.substr(0, line.find_first_of(" \t\r")));
   });
   std::error_code error;
   std::filesystem::directory_iterator at(root_.path(kGeneratedLocalesFolder), error);

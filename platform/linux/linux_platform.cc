@@ -58,7 +58,7 @@ struct LinuxPlatform::Services {
   LinuxProcess process;
   LinuxStandardStreams standardStreams;
   RecordedRegistry drivers{root, layer, propertyLists, log};
-  RecordedSnapshots stackSnapshots{root, layer};
+  RecordedSnapshots stackSnapshots{root, layer, log};
   ProcessState state;
 
   Platform platform{

@@ -3,6 +3,7 @@
 #include <sys/utsname.h>
 
 #include "base/limits.h"
+#include "platform/linux/line_reader.h"
 #include "platform/linux/property_list_file.h"
 
 namespace tavrel {
@@ -28,13 +29,6 @@ std::string unquoted(std::string_view text) {
     }
   }
   return value;
-}
-
-std::string_view trimmed(std::string_view line) {
-  constexpr std::string_view kBlank = " \t\r";
-  const std::size_t first = line.find_first_not_of(kBlank);
-  if (first == std::string_view::npos) return {};
-  return line.substr(first, line.find_last_not_of(kBlank) - first + 1);
 }
 
 /// Callers take every entry for a text.
@@ -83,8 +77,13 @@ std::string LinuxSystemVersion::text() {
 
 const plist::Dictionary& LinuxSystemVersion::known() {
   if (known_) return known_;
-  const auto file = readDictionaryFile(files_, propertyLists_, log_, root_.path(kVersionFile));
-  known_ = file ? stringsOf(file) : fromOsRelease();
+  const std::string path = root_.path(kVersionFile);
+  // From a file that is there and cannot be read nothing is known: what os-release says would look
+  // like an update of the OS.
+  const auto content = files_.readIfPresent(path, limits::kPropertyListBytes);
+  const bool isMissing = content && !*content;
+  known_ = isMissing ? fromOsRelease()
+                     : stringsOf(readDictionaryFile(files_, propertyLists_, log_, path));
   return known_;
 }
 

@@ -1,4 +1,5 @@
-// What system the device runs: /etc/tavrel/system-version.plist, else made from os-release.
+// What system the device runs: /etc/tavrel/system-version.plist or, where there is no such file,
+// made from os-release.
 #pragma once
 
 #include <optional>

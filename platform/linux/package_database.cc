@@ -5,6 +5,8 @@
 #include <string_view>
 #include <unordered_set>
 
+#include "base/format.h"
+#include "base/keyed_hash.h"
 #include "platform/linux/line_reader.h"
 #include "platform/linux/system_error.h"
 
@@ -40,12 +42,6 @@ struct Paragraph {
     }
   }
 };
-
-std::string_view trimmed(std::string_view text) {
-  const std::size_t first = text.find_first_not_of(" \t\r");
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(" \t\r") - first + 1);
-}
 
 /// Calls `use` for every paragraph that names a package.
 template <class Use>
@@ -85,7 +81,7 @@ class AutomaticPackages {
   }
 
  private:
-  std::unordered_set<std::string> identifiers_;
+  std::unordered_set<std::string, KeyedHash> identifiers_;
 };
 
 void logFailure(SystemLog& log, std::string_view path, int errorNumber,
@@ -113,7 +109,8 @@ std::size_t enumeratePackages(const DeviceRoot& root, SystemLog& log,
     });
   }
   logFailure(log, root.path(kStatusPath), status.errorNumber(),
-             "the number of installed packages is not known");
+             count == 0 ? "desktop entries are counted instead"
+                        : format("only the first %zu packages count", count));
   return count;
 }
 

@@ -27,15 +27,15 @@ bool fits(const plist::Dictionary& row, std::uint32_t method, ByteSpan request) 
 
 class RecordedDriverClient final : public UserClient {
  public:
-  explicit RecordedDriverClient(plist::Dictionary record) : record_(std::move(record)) {}
+  RecordedDriverClient(std::shared_ptr<const Recording> recording, const RecordedEntry& driver)
+      : recording_(std::move(recording)), driver_(driver) {}
 
   KernelReturn callMethod(std::uint32_t selector, std::span<const std::uint64_t>,
                           ByteSpan structureInput, std::span<std::uint64_t> scalarOutput,
                           MutableByteSpan structureOutput,
                           std::size_t& structureOutputLength) override {
     if (isClosed_) return kKernelBadArgument;
-    for (const plist::Value& value : record_.array("Methods")) {
-      const plist::Dictionary row = value.dictionary();
+    for (const plist::Dictionary& row : driver_.rows) {
       if (fits(row, selector, structureInput)) {
         return answer(row, scalarOutput, structureOutput, structureOutputLength);
       }
@@ -49,7 +49,7 @@ class RecordedDriverClient final : public UserClient {
 
   KernelReturn close() override {
     if (std::exchange(isClosed_, true)) return kKernelBadArgument;
-    return returnCodeOf(record_, "CloseError");
+    return returnCodeOf(driver_.record, "CloseError");
   }
 
  private:
@@ -73,14 +73,16 @@ class RecordedDriverClient final : public UserClient {
     return kKernelSuccess;
   }
 
-  const plist::Dictionary record_;
+  const std::shared_ptr<const Recording> recording_;
+  const RecordedEntry& driver_;
   bool isClosed_ = false;
 };
 
 }  // namespace
 
-std::unique_ptr<UserClient> connectToRecordedDriver(const plist::Dictionary& record) {
-  return std::make_unique<RecordedDriverClient>(record);
+std::unique_ptr<UserClient> connectToRecordedDriver(std::shared_ptr<const Recording> recording,
+                                                    const RecordedEntry& driver) {
+  return std::make_unique<RecordedDriverClient>(std::move(recording), driver);
 }
 
 }  // namespace tavrel

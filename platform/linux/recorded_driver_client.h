@@ -1,4 +1,4 @@
-// A connection to a recorded driver, whose numbered methods are answered from its "Methods".
+// A connection to a recorded driver, whose numbered methods are answered from its rows.
 //
 // The first row that fits a call answers it; a call that no row fits fails with 0xE00002C2. An
 // answer that is longer than the caller's buffer fails with 0xE00002E7 and writes nothing.
@@ -6,12 +6,13 @@
 
 #include <memory>
 
-#include "base/plist.h"
+#include "platform/linux/recording.h"
 #include "platform/user_client.h"
 
 namespace tavrel {
 
-/// `record` is the driver's entry in its recording, which is shared.
-std::unique_ptr<UserClient> connectToRecordedDriver(const plist::Dictionary& record);
+/// `driver` is an entry of `recording`.
+std::unique_ptr<UserClient> connectToRecordedDriver(std::shared_ptr<const Recording> recording,
+                                                    const RecordedEntry& driver);
 
 }  // namespace tavrel

@@ -3,6 +3,8 @@
 
 #include <cstdint>
 #include <optional>
+#include <span>
+#include <string>
 #include <string_view>
 
 #include "base/kernel_return.h"
@@ -25,6 +27,21 @@ inline std::optional<std::uint32_t> halfWordOf(const plist::Value& value) {
   const auto asSigned = static_cast<std::int64_t>(static_cast<std::int32_t>(low));
   return *word == low || *word == static_cast<std::uint64_t>(asSigned) ? low : UINT32_MAX;
 }
+
+/// A field and what it must be when it is there.
+struct RecordedField {
+  enum class Form : std::uint8_t { Integer, Integers, String, Data, Array, Dictionary };
+
+  std::string_view key;
+  Form form;
+};
+
+/// What the value must be, in words, when it is not what the field of its key must be; null
+/// otherwise.
+const char* missedForm(std::span<const RecordedField> fields, const plist::Entry& entry);
+
+/// What is wrong with the fields of a record, as the end of a message; empty when nothing is.
+std::string faultOf(std::span<const RecordedField> fields, const plist::Dictionary& record);
 
 /// The return code that a recording gives under `key`; 0 when it gives none.
 inline KernelReturn returnCodeOf(const plist::Dictionary& record, std::string_view key) {

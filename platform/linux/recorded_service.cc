@@ -78,7 +78,7 @@ KernelReturn RecordedService::open(std::uint32_t type, std::unique_ptr<UserClien
   if (error != kKernelSuccess) return error;
   if (type != 0) return kKernelBadArgument;
   client = entry_.isHub ? connectToReportHub(recording_, entry_.record, log_)
-                        : connectToRecordedDriver(entry_.record);
+                        : connectToRecordedDriver(recording_, entry_);
   return kKernelSuccess;
 }
 

@@ -9,12 +9,14 @@ namespace {
 
 class RecordedSnapshot final : public StackSnapshot {
  public:
-  RecordedSnapshot(FileLayer& files, std::string path) : files_(files), path_(std::move(path)) {}
+  RecordedSnapshot(FileLayer& files, SystemLog& log, std::string path)
+      : files_(files), log_(log), path_(std::move(path)) {}
 
   bool setFlags(std::uint32_t flags) override { return flags == kStackSnapshotKeyCodedData; }
 
   bool capture() override {
     auto content = files_.readIfPresent(path_, limits::kDeviceAllocationBytes);
+    if (!content) log_.write(LogLevel::Error, content.error().message);
     content_ = content ? std::move(*content) : std::nullopt;
     return content_.has_value();
   }
@@ -26,6 +28,7 @@ class RecordedSnapshot final : public StackSnapshot {
 
  private:
   FileLayer& files_;
+  SystemLog& log_;
   std::string path_;
   std::optional<std::string> content_;
 };
@@ -34,7 +37,7 @@ class RecordedSnapshot final : public StackSnapshot {
 
 std::unique_ptr<StackSnapshot> RecordedSnapshots::create() {
   return std::make_unique<RecordedSnapshot>(
-      files_, root_.path("/var/lib/tavrel/registry/stack-snapshot.bin"));
+      files_, log_, root_.path("/var/lib/tavrel/registry/stack-snapshot.bin"));
 }
 
 }  // namespace tavrel

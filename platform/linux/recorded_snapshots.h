@@ -1,22 +1,26 @@
 // Stack snapshots played back from /var/lib/tavrel/registry/stack-snapshot.bin under the device
-// root: the bytes of one snapshot in the kernel's key-coded data format.
+// root: the bytes of one snapshot in the kernel's key-coded data format. Without the file capturing
+// fails; so it does, with a line in the system log, when the file cannot be read.
 #pragma once
 
 #include "platform/linux/device_root.h"
 #include "platform/linux/file_layer.h"
 #include "platform/stack_snapshot.h"
+#include "platform/system_log.h"
 
 namespace tavrel {
 
 class RecordedSnapshots final : public StackSnapshots {
  public:
-  RecordedSnapshots(const DeviceRoot& root, FileLayer& files) : root_(root), files_(files) {}
+  RecordedSnapshots(const DeviceRoot& root, FileLayer& files, SystemLog& log)
+      : root_(root), files_(files), log_(log) {}
 
   std::unique_ptr<StackSnapshot> create() override;
 
  private:
   const DeviceRoot& root_;
   FileLayer& files_;
+  SystemLog& log_;
 };
 
 }  // namespace tavrel

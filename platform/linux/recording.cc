@@ -4,30 +4,94 @@
 
 #include "base/format.h"
 #include "platform/linux/recorded_fields.h"
+#include "platform/report_protocol.h"
 
 namespace tavrel {
 namespace {
 
-// The hub of all parts without its channels: what an earlier part says goes before a later one. An
-// empty handle when no part has a hub.
-plist::Dictionary mergedHub(std::span<const RecordingPart> parts) {
+using Form = RecordedField::Form;
+
+constexpr RecordedField kPartFields[] = {
+    {"Services", Form::Array}, {"Hub", Form::Dictionary}, {"Generation", Form::Integer}};
+constexpr RecordedField kServiceFields[] = {
+    {"Name", Form::String},          {"EntryID", Form::Integer},   {"RetainCount", Form::Integer},
+    {"Parents", Form::Dictionary},   {"Methods", Form::Array},     {"Properties", Form::Dictionary},
+    {"NameError", Form::Integer},    {"OpenError", Form::Integer}, {"CloseError", Form::Integer},
+    {"EntryIDError", Form::Integer},
+};
+constexpr RecordedField kHubFields[] = {
+    {"Channels", Form::Array}, {"MethodErrors", Form::Dictionary}, {"MapError", Form::Integer}};
+constexpr RecordedField kRowFields[] = {
+    {"Method", Form::Integer}, {"Request", Form::Data},     {"Selector", Form::Integer},
+    {"Flags", Form::Integer},  {"Error", Form::Integer},    {"OutputLength", Form::Integer},
+    {"Output", Form::Data},    {"Scalars", Form::Integers},
+};
+
+std::string faultOfService(const plist::Dictionary& record) {
+  const auto className = record.string("Class");
+  if (!className) return "it has no \"Class\"; name the class of the driver";
+  if (*className == kReportHubClass) {
+    return "its \"Class\" is the hub's; describe that in \"Hub\"";
+  }
+  return faultOf(kServiceFields, record);
+}
+
+// The rows that can be played, of service number `service` of its part.
+std::vector<plist::Dictionary> rowsOf(const plist::Dictionary& record, std::string_view origin,
+                                      std::size_t service, RefusalLog& refusals) {
+  std::vector<plist::Dictionary> rows;
+  std::size_t index = 0;
+  for (const plist::Value& value : record.array("Methods")) {
+    const plist::Dictionary row = value.dictionary();
+    const std::string fault = row.contains("Method")
+                                  ? faultOf(kRowFields, row)
+                                  : "it has no \"Method\"; give the number of the method";
+    if (fault.empty()) {
+      rows.push_back(row);
+    } else {
+      refusals.write(format("%s: row %zu of the \"Methods\" of service %zu is left out: %s", origin,
+                            index, service, fault));
+    }
+    ++index;
+  }
+  return rows;
+}
+
+// Adds what earlier parts have not said.
+void mergeHub(plist::Dictionary& merged, const RecordingPart& part, RefusalLog* refusals) {
+  const auto isRefused = [&](std::string_view key, const char* where, const char* wanted) {
+    if (wanted && refusals) {
+      refusals->write(format("%s: \"%s\" of the %s is left out: it must be %s", part.origin, key,
+                             where, wanted));
+    }
+    return wanted != nullptr;
+  };
+  for (const plist::Entry& entry : part.content.dictionary("Hub")) {
+    const std::string_view key = entry.key;
+    const char* wanted = missedForm(kServiceFields, entry);
+    if (!wanted) wanted = missedForm(kHubFields, entry);
+    if (isRefused(key, "hub", wanted) || key == "Channels") continue;
+    if (key != "MethodErrors") {
+      if (!merged.contains(key)) merged.set(entry.key, entry.value);
+      continue;
+    }
+    plist::Dictionary errors = merged.dictionary(key);
+    if (!errors) merged.set(entry.key, errors = plist::Dictionary::create());
+    for (const plist::Entry& error : entry.value.dictionary()) {
+      const char* const wantedCode = wordOf(error.value) ? nullptr : "an integer";
+      if (isRefused(error.key, "hub's \"MethodErrors\"", wantedCode)) continue;
+      if (!errors.contains(error.key)) errors.set(error.key, error.value);
+    }
+  }
+}
+
+// The hub of all parts without its channels. An empty handle when no part has a hub.
+plist::Dictionary mergedHub(std::span<const RecordingPart> parts, RefusalLog* refusals) {
   plist::Dictionary merged;
   for (const RecordingPart& part : parts) {
-    const plist::Dictionary hub = part.content.dictionary("Hub");
-    if (hub && !merged) merged = plist::Dictionary::create(hub.size());
-    for (const plist::Entry& entry : hub) {
-      const std::string_view key = entry.key;
-      if (key == "Channels") continue;
-      if (!merged.contains(entry.key)) {
-        const plist::Dictionary inner = entry.value.dictionary();
-        merged.set(entry.key, inner ? plist::Value(plist::mutableCopy(inner)) : entry.value);
-      } else if (plist::Dictionary errors = merged.dictionary(key);
-                 key == "MethodErrors" && errors) {
-        for (const plist::Entry& error : entry.value.dictionary()) {
-          if (!errors.contains(error.key)) errors.set(error.key, error.value);
-        }
-      }
-    }
+    if (!part.content.dictionary("Hub")) continue;
+    if (!merged) merged = plist::Dictionary::create();
+    mergeHub(merged, part, refusals);
   }
   return merged;
 }
@@ -37,24 +101,29 @@ plist::Dictionary mergedHub(std::span<const RecordingPart> parts) {
 Recording::Recording(std::span<const RecordingPart> parts, SystemLog& log) {
   RefusalLog refusals(log);
   for (const RecordingPart& part : parts) {
+    for (const plist::Entry& entry : part.content) {
+      if (const char* const wanted = missedForm(kPartFields, entry)) {
+        refusals.write(
+            format("%s: \"%s\" is left out: it must be %s", part.origin, entry.key, wanted));
+      }
+    }
     std::size_t index = 0;
     for (const plist::Value& value : part.content.array("Services")) {
       const plist::Dictionary record = value.dictionary();
-      const auto className = record.string("Class");
-      if (!className || *className == kReportHubClass) {
-        refusals.write(format("%s: service %zu is left out: %s", part.origin, index,
-                              className ? "its \"Class\" is the hub's; describe that in \"Hub\""
-                                        : "it has no \"Class\"; name the class of the driver"));
+      if (const std::string fault = faultOfService(record); !fault.empty()) {
+        refusals.write(format("%s: service %zu is left out: %s", part.origin, index, fault));
       } else {
-        add({record, std::string(*className), wordOf(record.get("EntryID"))}, part.origin,
-            refusals);
+        add({record, std::string(*record.string("Class")), wordOf(record.get("EntryID")),
+             rowsOf(record, part.origin, index, refusals)},
+            part.origin, refusals);
       }
       ++index;
     }
     hubChannels_.add(part.content.dictionary("Hub").array("Channels"), part.origin, refusals);
   }
-  if (const plist::Dictionary hub = mergedHub(parts)) {
-    add({hub, std::string(kReportHubClass), wordOf(hub.get("EntryID")), true}, "the hub", refusals);
+  if (const plist::Dictionary hub = mergedHub(parts, &refusals)) {
+    add({hub, std::string(kReportHubClass), wordOf(hub.get("EntryID")), {}, true}, "the hub",
+        refusals);
   }
 }
 
@@ -91,7 +160,7 @@ plist::Dictionary mergedRecording(std::span<const RecordingPart> parts) {
       channels.append(channel);
   }
   plist::Dictionary merged{{"Generation", generationOf(parts)}, {"Services", services}};
-  if (plist::Dictionary hub = mergedHub(parts)) {
+  if (plist::Dictionary hub = mergedHub(parts, nullptr)) {
     hub.set("Channels", channels);
     merged.set("Hub", hub);
   }

@@ -2,7 +2,7 @@
 // class, and the channels of the hub. docs/registry.md describes the format.
 //
 // The dictionaries of a recording are shared with it, not copied. An entry that cannot be played is
-// left out, and a line in the system log says so.
+// left out, and a line in the system log says so. Of the hub only the malformed field is left out.
 #pragma once
 
 #include <cstddef>
@@ -14,10 +14,10 @@
 #include <unordered_map>
 #include <vector>
 
+#include "base/keyed_hash.h"
 #include "base/plist.h"
 #include "platform/linux/hub_channels.h"
 #include "platform/linux/refusal_log.h"
-#include "platform/report_protocol.h"
 
 namespace tavrel {
 
@@ -31,6 +31,7 @@ struct RecordedEntry {
   plist::Dictionary record;
   std::string className;
   std::optional<std::uint64_t> entryID;
+  std::vector<plist::Dictionary> rows = {};  // of its "Methods"
   bool isHub = false;
 };
 
@@ -50,7 +51,7 @@ class Recording {
 
   std::vector<RecordedEntry> services_;
   std::unordered_map<std::uint64_t, std::size_t> byID_;
-  std::unordered_map<std::string, std::vector<std::size_t>> byClass_;
+  std::unordered_map<std::string, std::vector<std::size_t>, KeyedHash> byClass_;
   HubChannels hubChannels_;
 };
 

@@ -1,6 +1,5 @@
 #include "platform/linux/recording_folder.h"
 
-#include <algorithm>
 #include <utility>
 
 #include "platform/linux/property_list_file.h"
@@ -41,10 +40,12 @@ bool RecordingFolder::update(std::vector<RecordingPart>& parts) {
   std::vector<Stamp> stamps = stampFiles();
   if (stamps == stamps_) return false;
   std::vector<RecordingPart> updated;
+  std::size_t known = 0;  // both lists are in the order of their names
   for (const Stamp& stamp : stamps) {
-    const auto known = std::find(stamps_.begin(), stamps_.end(), stamp);
-    if (known != stamps_.end()) {
-      updated.push_back(parts[static_cast<std::size_t>(known - stamps_.begin())]);
+    while (known < stamps_.size() && stamps_[known].path < stamp.path)
+      ++known;
+    if (known < stamps_.size() && stamps_[known] == stamp) {
+      updated.push_back(parts[known]);
     } else {
       updated.push_back({stamp.path, readDictionaryFile(files_, propertyLists_, log_, stamp.path)});
     }

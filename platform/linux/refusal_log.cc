@@ -1,12 +1,12 @@
 #include "platform/linux/refusal_log.h"
 
 #include "base/limits.h"
-#include "platform/linux/guarded_end.h"
+#include "platform/guarded.h"
 
 namespace tavrel {
 
 RefusalLog::~RefusalLog() {
-  endGuarded(log_, "tell what was not logged", [this] { sayLeftOut(); });
+  runGuarded(log_, "tell what was not logged", [this] { sayLeftOut(); });
 }
 
 void RefusalLog::sayLeftOut() {

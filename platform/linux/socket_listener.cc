@@ -39,6 +39,9 @@ class SocketListener::Peer final : public PeerConnection {
 
   bool hasFailed() const { return hasFailed_; }
 
+  /// Makes its end an event, as its beginning was.
+  void count() { counts_ = true; }
+
  private:
   /// May destroy the peer.
   Activity receive() {
@@ -47,15 +50,14 @@ class SocketListener::Peer final : public PeerConnection {
     if (std::holds_alternative<NoMessage>(received)) return Activity::Nothing;
     if (const auto* message = std::get_if<plist::Dictionary>(&received)) {
       listener_.silentInARow_ = 0;
-      hasSent_ = true;
+      counts_ = true;
       if (handler_) handler_(*message);
       return Activity::Event;
     }
-    Activity activity = hasSent_ ? Activity::Event : Activity::Nothing;
     if (const auto* error = std::get_if<Error>(&received)) {
       listener_.refusals_.write(dropped(error->message));
-      activity = Activity::Nothing;
     }
+    const Activity activity = counts_ ? Activity::Event : Activity::Nothing;
     if (handler_) handler_(plist::Value());
     listener_.release(id_);
     return activity;
@@ -69,7 +71,7 @@ class SocketListener::Peer final : public PeerConnection {
   std::uint64_t id_;
   ucred user_;
   EventHandler handler_;
-  bool hasSent_ = false;
+  bool counts_ = false;  // its end is an event
   bool hasFailed_ = false;
   Descriptor socket_;
   LinuxEventLoop::Source source_;  // ends before its descriptor
@@ -180,6 +182,7 @@ LinuxEventLoop::Activity SocketListener::acceptPeer() {
   }
   if (silentInARow_ == limits::kSilentConnections) return Activity::Nothing;
   ++silentInARow_;
+  peer->count();
   return Activity::Event;
 }
 

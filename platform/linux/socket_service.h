@@ -12,10 +12,12 @@
 //
 // What counts as an event, and so makes the wait for the next one begin anew:
 //   - a message, whatever it says;
-//   - a new peer. Of new peers in a row, without a message from anybody in between, only the first
-//     `limits::kSilentConnections` count; further ones are served, but the wait goes on;
-//   - the closure of a peer that has sent a message.
-// What was refused or dropped never counts.
+//   - a new peer, and its end, by itself or because it was dropped. Of new peers in a row, without
+//   a
+//     message from anybody in between, only the first `limits::kSilentConnections` count; further
+//     ones are served, but the wait goes on;
+//   - the end of a peer that has sent a message.
+// A peer that was refused never counts.
 //
 // Beyond `limits::kServicePeers` peers new ones wait in the kernel's queue until a peer leaves;
 // when the system is short of descriptors or memory, also until the next try a second later. Nobody

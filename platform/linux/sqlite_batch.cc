@@ -1,9 +1,9 @@
 #include "platform/linux/sqlite_batch.h"
 
 #include <algorithm>
-#include <functional>
 #include <utility>
 
+#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/sqlite_schema.h"
 
@@ -57,7 +57,7 @@ struct SqliteBatch::Statements {
 
 std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
   // An odd factor keeps the days of one key apart.
-  return std::hash<std::string_view>()(name.key) +
+  return keyedHash(name.key) +
          static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
 }
 

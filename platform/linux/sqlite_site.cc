@@ -1,36 +1,21 @@
 #include "platform/linux/sqlite_site.h"
 
 #include <cerrno>
-#include <cmath>
-#include <cstdio>
 #include <cstring>
 #include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
-#include "base/civil_time.h"
-#include "base/plist.h"
+#include "base/arithmetic.h"
+#include "platform/linux/stamp.h"
+#include "platform/statistics_store.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kCorruptionDomain = "com.norvane.tallied";
-constexpr std::string_view kCorruptionKey = "DatabaseCorruptionCount";
-
 std::string folderOf(const std::string& path) {
   return path.substr(0, path.rfind('/') + 1);
-}
-
-// "20261124T221246Z".
-std::string stampOf(plist::Date instant) {
-  const double seconds = std::floor(instant.secondsSince1970());
-  const CivilTime time = civilFromSeconds(saturatingInt64(seconds));
-  std::string stamp = dateText(time.date);
-  std::erase(stamp, '-');
-  char clock[24];
-  std::snprintf(clock, sizeof clock, "T%02u%02u%02uZ", time.hour, time.minute, time.second);
-  return stamp + clock;
 }
 
 // A name of which neither the file nor its log files exist yet.
@@ -95,7 +80,7 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
   try {
     const StoreFolderLock lock(path, *busy);
     if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
-    const std::string name = freeName(path + ".corrupt-" + stampOf(clock.now()));
+    const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
     // The log goes first: were the process killed in between, the file would be found damaged once
     // more, while a log without its file would be taken for a new store's.
     if (!moveFile(path + "-wal", name + "-wal") || !moveFile(path + "-shm", name + "-shm") ||
@@ -110,10 +95,10 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
     return StoreFailure{failure.fault, failure.message + "; " + obstacle.message};
   }
   const std::int64_t count =
-      preferences.ZTXPreferencesGetIntegerValue(kCorruptionKey, kCorruptionDomain);
-  preferences.ZTXPreferencesSetValue(kCorruptionKey, plist::Number(wrappingAdd(count, 1)),
-                                     kCorruptionDomain);
-  preferences.ZTXPreferencesSynchronize(kCorruptionDomain);
+      preferences.ZTXPreferencesGetIntegerValue(kStoreCorruptionsKey, kStoreCorruptionsDomain);
+  preferences.ZTXPreferencesSetValue(kStoreCorruptionsKey, plist::Number(wrappingAdd(count, 1)),
+                                     kStoreCorruptionsDomain);
+  preferences.ZTXPreferencesSynchronize(kStoreCorruptionsDomain);
   return std::nullopt;
 }
 

@@ -9,7 +9,7 @@
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
-#include "platform/linux/guarded_end.h"
+#include "platform/guarded.h"
 #include "platform/linux/sqlite_schema.h"
 
 namespace tavrel {
@@ -24,7 +24,7 @@ SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& pref
             leavesDamaged} {}
 
 SqliteStore::~SqliteStore() {
-  endGuarded(site_.log, "commit the last statistics", [this] { commit(); });
+  runGuarded(site_.log, "commit the last statistics", [this] { commit(); });
 }
 
 std::int32_t SqliteStore::BHDaysSince1970() {

@@ -7,13 +7,10 @@
 #include "base/format.h"
 
 namespace tavrel {
-namespace {
 
 std::int64_t wholeSeconds(plist::Date instant) {
   return saturatingInt64(std::floor(instant.secondsSince1970()));
 }
-
-}  // namespace
 
 std::string compactStamp(plist::Date instant) {
   const CivilTime time = civilFromSeconds(wholeSeconds(instant));
@@ -31,8 +28,7 @@ std::string preciseStamp(plist::Date instant) {
 }
 
 std::int64_t dayOf(plist::Date instant) {
-  const std::int64_t seconds = wholeSeconds(instant);
-  return seconds / kSecondsPerDay - (seconds % kSecondsPerDay < 0 ? 1 : 0);
+  return daysFromCivil(civilFromSeconds(wholeSeconds(instant)).date);
 }
 
 }  // namespace tavrel

@@ -1,11 +1,15 @@
 // Instants in names of files and in lines for people, in UTC.
 #pragma once
 
+#include <cstdint>
 #include <string>
 
 #include "base/plist.h"
 
 namespace tavrel {
+
+/// Seconds since 1970-01-01 00:00:00 UTC, rounded down, saturated.
+std::int64_t wholeSeconds(plist::Date instant);
 
 /// "20261116T180218Z", for names.
 std::string compactStamp(plist::Date instant);

@@ -79,7 +79,7 @@ class BinaryReader {
     if (count <= (objectsEnd_ - object.content) / width) return true;
     return fail(object.offset, "the object does not end before the table of offsets");
   }
-  bool admitBytes(const Object& object, std::size_t count);
+  bool admitBytes(std::size_t offset, std::size_t count);
   bool enter(const Reference& reference, Object& object, std::size_t referencesPerElement);
   Reference referenceAt(const Object& object, std::size_t index) const {
     const std::size_t at = object.content + index * referenceWidth_;
@@ -255,19 +255,20 @@ bool BinaryReader::readReal(const Object& object, Value& out) {
 }
 
 // Data may be written in place, so each reference has its own, and objects may overlap: without a
-// limit a small document could ask for any amount of memory.
-bool BinaryReader::admitBytes(const Object& object, std::size_t count) {
+// limit a small document could ask for any amount of memory. Texts are shared, but whoever prints
+// or encodes the value has each reference to them in full.
+bool BinaryReader::admitBytes(std::size_t offset, std::size_t count) {
   contentBytes_ += count;
   if (contentBytes_ <= limits::kPropertyListBytes) return true;
   return fail(
-      object.offset,
+      offset,
       format("texts and data, after shared references are expanded, are more than %zu bytes",
              limits::kPropertyListBytes));
 }
 
 bool BinaryReader::readData(Object& object, Value& out) {
   if (!readLength(object) || !holds(object, object.length, 1)) return false;
-  if (!admitBytes(object, object.length)) return false;
+  if (!admitBytes(object.offset, object.length)) return false;
   out = Data(bytes_.subspan(object.content, object.length));
   return true;
 }
@@ -278,7 +279,6 @@ bool BinaryReader::readText(const Reference& reference, Object& object, String& 
     const std::size_t width = (object.marker & kTypeMask) == kAscii ? 1 : 2;
     if (!readLength(object) || !holds(object, object.length, width)) return false;
     const ByteSpan bytes = bytes_.subspan(object.content, object.length * width);
-    if (!admitBytes(object, bytes.size())) return false;
     if (width == 2) {
       known = utf8FromUtf16(bytes);
     } else if (isAscii(asText(bytes))) {
@@ -288,13 +288,13 @@ bool BinaryReader::readText(const Reference& reference, Object& object, String& 
     }
   }
   out = known;
-  return true;
+  return admitBytes(object.offset, out.view().size());
 }
 
 bool BinaryReader::readKey(const Reference& reference, String& out) {
   if (reference.number < objectCount_) {
     out = texts_[static_cast<std::size_t>(reference.number)];
-    if (!out.view().empty()) return true;
+    if (!out.view().empty()) return admitBytes(reference.at, out.view().size());
   }
   Object object;
   if (!open(reference, object)) return false;

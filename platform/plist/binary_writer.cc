@@ -11,6 +11,7 @@
 #include <vector>
 
 #include "base/keyed_hash.h"
+#include "base/limits.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/binary_layout.h"
 #include "platform/plist/encoding_walk.h"
@@ -107,7 +108,7 @@ class BinaryWriter {
   bool number(const Value& value, std::size_t depth);
   bool numberContainer(const Value& value, std::size_t depth);
   void numberWord(const Word& word);
-  void numberText(std::string_view text);
+  bool numberText(std::string_view text);
   void addUnique(const Object& object);
   std::uint32_t& slotFor(const Object& object);
   void growSlots();
@@ -118,13 +119,14 @@ class BinaryWriter {
   void append(const Object& object, std::size_t referenceWidth);
   void appendTable(const std::vector<std::size_t>& offsets, std::size_t referenceWidth);
 
-  EncodingGuard guard_;
+  EncodingGuard guard_{limits::kPropertyListValues};
   SortedEntries entries_{Alphabet::Unicode};
   std::vector<Object> objects_;
   std::vector<std::size_t> references_;
   std::vector<std::uint32_t> slots_;  // object number + 1, 0 for a free slot; a power of two
   std::size_t uniqueObjects_ = 0;
-  std::size_t last_ = 0;  // the object that was numbered or met last
+  std::size_t contentBytes_ = 0;  // of texts and data, each as often as it occurs, as readers count
+  std::size_t last_ = 0;          // the object that was numbered or met last
   std::string out_;
 };
 
@@ -146,11 +148,11 @@ bool BinaryWriter::number(const Value& value, std::size_t depth) {
       break;
     }
     case Kind::String:
-      numberText(*value.string());
-      break;
+      return numberText(*value.string());
     case Kind::Data:
       add({.type = kData, .text = asText(value.data().bytes())});
-      break;
+      contentBytes_ += value.data().size();
+      return guard_.admitBytes(contentBytes_);
     case Kind::Array:
     case Kind::Dictionary:
       return numberContainer(value, depth);
@@ -175,7 +177,7 @@ bool BinaryWriter::numberContainer(const Value& value, std::size_t depth) {
     const std::size_t firstEntry = entries_.push(value.dictionary());
     for (std::size_t i = 0; i < count / 2; ++i) {
       const SortedEntries::Item item = entries_[firstEntry + i];
-      numberText(item.key);
+      if (!numberText(item.key)) return false;
       references_[first + i] = last_;
       if (!number(*item.value, depth + 1)) return guard_.under(item.key);
       references_[first + count / 2 + i] = last_;
@@ -192,8 +194,10 @@ void BinaryWriter::numberWord(const Word& word) {
   addUnique({.hash = hash, .type = word.marker, .word = word});
 }
 
-void BinaryWriter::numberText(std::string_view text) {
+bool BinaryWriter::numberText(std::string_view text) {
   addUnique({.hash = keyedHash(text), .type = kAscii, .text = text});
+  contentBytes_ += text.size();
+  return guard_.admitBytes(contentBytes_);
 }
 
 // Adds the object unless there is one like it already.

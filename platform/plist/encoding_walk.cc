@@ -22,8 +22,8 @@ bool EncodingGuard::admit(const Value& value, std::size_t depth) {
     default:
       break;
   }
-  if (++values_ <= limits::kPropertyListValues) return true;
-  reason_ = format("it has more than %zu values", limits::kPropertyListValues);
+  if (++values_ <= largestCount_) return true;
+  reason_ = format("it has more than %zu values", largestCount_);
   return false;
 }
 

@@ -17,6 +17,8 @@ namespace tavrel::plist {
 /// failure, so that a walk can return what they answer.
 class EncodingGuard {
  public:
+  explicit EncodingGuard(std::size_t largestCount) : largestCount_(largestCount) {}
+
   /// `depth` is the number of containers around the value.
   bool admit(const Value& value, std::size_t depth);
   bool admitBytes(std::size_t documentBytes);
@@ -31,6 +33,7 @@ class EncodingGuard {
   Error error() const;
 
  private:
+  const std::size_t largestCount_;
   std::size_t values_ = 0;
   std::string reason_;
   std::string path_;

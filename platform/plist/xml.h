@@ -28,7 +28,8 @@ namespace tavrel::plist {
 /// more than 10^9 years off), and for what the limits of base/limits.h would not let back in.
 Expected<std::string> writeXml(const Value& value);
 
-/// The value is the caller's own. Of two equal keys in one dictionary the later wins.
+/// The value is the caller's own. Want of memory is no error of the document, which may be whole:
+/// it throws std::bad_alloc. Of two equal keys in one dictionary the later wins.
 Expected<Value> readXml(ByteSpan bytes);
 
 }  // namespace tavrel::plist

@@ -2,8 +2,10 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
+#include <exception>
 #include <expat.h>
 #include <memory>
+#include <new>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -70,10 +72,24 @@ class XmlReader {
  public:
   Expected<Value> read(ByteSpan bytes);
 
+  /// Runs `action` unless the parse has failed. Nothing may be thrown through the parser, which is
+  /// C: an exception ends the parse and goes on behind it.
+  template <class Action>
+  void guarded(Action action) noexcept {
+    if (failed_) return;
+    try {
+      action(*this);
+    } catch (...) {
+      failed_ = true;
+      thrown_ = std::current_exception();
+      XML_StopParser(parser_.get(), XML_FALSE);
+    }
+  }
+
   void startElement(std::string_view name);
   void endElement();
   void characters(std::string_view text);
-  /// The first failure counts; it ends the parse.
+  /// Ends the parse.
   void fail(std::string_view reason);
 
  private:
@@ -96,6 +112,7 @@ class XmlReader {
 
   bool failed_ = false;
   std::string error_;
+  std::exception_ptr thrown_;
 
   bool insidePlist_ = false;
   Element scalar_ = Element::None;  // the element whose text is being gathered
@@ -107,23 +124,26 @@ class XmlReader {
   Value root_;
 };
 
-// Nothing may be thrown through the parser, which is C: without memory the process ends here.
 void XMLCALL onStart(void* reader, const XML_Char* name, const XML_Char** /*attributes*/) noexcept {
-  static_cast<XmlReader*>(reader)->startElement(name);
+  static_cast<XmlReader*>(reader)->guarded([&](XmlReader& self) { self.startElement(name); });
 }
 void XMLCALL onEnd(void* reader, const XML_Char* /*name*/) noexcept {
-  static_cast<XmlReader*>(reader)->endElement();
+  static_cast<XmlReader*>(reader)->guarded([](XmlReader& self) { self.endElement(); });
 }
 void XMLCALL onCharacters(void* reader, const XML_Char* text, int length) noexcept {
-  static_cast<XmlReader*>(reader)->characters({text, static_cast<std::size_t>(length)});
+  static_cast<XmlReader*>(reader)->guarded([&](XmlReader& self) {
+    self.characters({text, static_cast<std::size_t>(length)});
+  });
 }
 void XMLCALL onEntity(void* reader, const XML_Char* name, int, const XML_Char*, int,
                       const XML_Char*, const XML_Char*, const XML_Char*, const XML_Char*) noexcept {
-  static_cast<XmlReader*>(reader)->fail("entity \"" + excerpt(name) +
-                                        "\" is declared; a property list may declare none");
+  static_cast<XmlReader*>(reader)->guarded([&](XmlReader& self) {
+    self.fail("entity \"" + excerpt(name) + "\" is declared; a property list may declare none");
+  });
 }
 void XMLCALL onSkippedEntity(void* reader, const XML_Char* name, int) noexcept {
-  static_cast<XmlReader*>(reader)->fail("entity \"" + excerpt(name) + "\" is not known");
+  static_cast<XmlReader*>(reader)->guarded(
+      [&](XmlReader& self) { self.fail("entity \"" + excerpt(name) + "\" is not known"); });
 }
 
 Expected<Value> XmlReader::read(ByteSpan bytes) {
@@ -132,7 +152,7 @@ Expected<Value> XmlReader::read(ByteSpan bytes) {
                         bytes.size(), limits::kPropertyListBytes)};
   }
   parser_.reset(XML_ParserCreate(nullptr));
-  if (!parser_) return Error{"XML property list: no memory for the parser"};
+  if (!parser_) throw std::bad_alloc();
   XML_SetUserData(parser_.get(), this);
   XML_SetElementHandler(parser_.get(), onStart, onEnd);
   XML_SetCharacterDataHandler(parser_.get(), onCharacters);
@@ -141,9 +161,12 @@ Expected<Value> XmlReader::read(ByteSpan bytes) {
 
   const XML_Status status = XML_Parse(parser_.get(), reinterpret_cast<const char*>(bytes.data()),
                                       static_cast<int>(bytes.size()), XML_TRUE);
+  if (thrown_) std::rethrow_exception(thrown_);
   if (failed_) return Error{std::move(error_)};
   if (status != XML_STATUS_OK) {
-    return Error{located(XML_ErrorString(XML_GetErrorCode(parser_.get())))};
+    const XML_Error code = XML_GetErrorCode(parser_.get());
+    if (code == XML_ERROR_NO_MEMORY) throw std::bad_alloc();
+    return Error{located(XML_ErrorString(code))};
   }
   return std::move(root_);
 }
@@ -155,14 +178,12 @@ std::string XmlReader::located(std::string_view reason) const {
 }
 
 void XmlReader::fail(std::string_view reason) {
-  if (failed_) return;
   failed_ = true;
   error_ = located(reason);
   XML_StopParser(parser_.get(), XML_FALSE);
 }
 
 void XmlReader::startElement(std::string_view name) {
-  if (failed_) return;
   const Element element = elementNamed(name);
   if (scalar_ != Element::None) {
     return fail("<" + excerpt(name) + "> stands where only text may");
@@ -210,7 +231,6 @@ void XmlReader::startValue(Element element, std::string_view name) {
 }
 
 void XmlReader::endElement() {
-  if (failed_) return;
   if (scalar_ != Element::None) {
     endScalar();
   } else if (!containers_.empty()) {
@@ -281,7 +301,6 @@ void XmlReader::add(Value value) {
 }
 
 void XmlReader::characters(std::string_view text) {
-  if (failed_) return;
   if (scalar_ >= Element::Key && scalar_ <= Element::Data) {
     text_.append(text);
   } else if (text.find_first_not_of(kSpace) != std::string_view::npos) {

@@ -1,5 +1,6 @@
 #include <algorithm>
 #include <cstddef>
+#include <limits>
 #include <string>
 #include <string_view>
 
@@ -126,7 +127,8 @@ class XmlWriter {
   }
 
   std::string out_;
-  EncodingGuard guard_;
+  // Every value takes some bytes, which are limited.
+  EncodingGuard guard_{std::numeric_limits<std::size_t>::max()};
   SortedEntries entries_{Alphabet::Xml};
 };
 

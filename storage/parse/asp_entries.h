@@ -49,8 +49,6 @@ class ASPEntryArena {
     return next_++;
   }
 
-  bool empty() const { return blocks_ == nullptr; }
-
  private:
   struct Block;
 

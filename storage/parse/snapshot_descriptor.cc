@@ -36,8 +36,20 @@ std::optional<std::string_view> terminatedText(ByteSpan bytes) {
   return text.substr(0, end);
 }
 
+// Fails when the bytes at an offset in the last record are not all in the buffer.
+Status checkRead(const SnapshotDescriptor& layout, std::size_t recordBytes, std::size_t field,
+                 std::uint64_t offset, std::uint64_t bytes) {
+  if (layout.count == 0 || bytes == 0) return Done{};
+  const std::uint64_t start = std::uint64_t{layout.stride} * (layout.count - 1);
+  const std::uint64_t end = start + offset + bytes;
+  if (end <= recordBytes) return Done{};
+  return Error{format("field %zu of the last of %zu records ends at byte %llu of a buffer of %zu",
+                      field, layout.count, end, recordBytes)};
+}
+
 // Adds the field of one entry of the table if it prints anything.
-Status addField(SnapshotDescriptor& out, ByteSpan entry, std::size_t index) {
+Status addField(SnapshotDescriptor& out, ByteSpan entry, std::size_t index,
+                std::size_t recordBytes) {
   const std::size_t kind = *loadLittle16(entry, kEntryKind);
   if (kind >= std::size(kKinds)) return Done{};
   const auto text = terminatedText(entry.subspan(kEntryFormat));
@@ -50,15 +62,13 @@ Status addField(SnapshotDescriptor& out, ByteSpan entry, std::size_t index) {
     return Error{format("the format %s of field %zu asks for what kind %zu does not give", quoted,
                         index, kind)};
   }
-  if (field->offset + field->bytesRead() > out.stride) {
-    return Error{format("field %zu ends at byte %llu of a record of %zu", index,
-                        field->offset + field->bytesRead(), out.stride)};
-  }
-  if (!text->empty() || field->triples != 0) out.fields.push_back(*field);
-  return Done{};
+  if (text->empty() && field->triples == 0) return Done{};
+  out.fields.push_back(*field);
+  return checkRead(out, recordBytes, index, field->offset, field->bytesRead());
 }
 
-Status addFields(SnapshotDescriptor& out, ByteSpan descriptor, std::uint64_t tableOffset) {
+Status addFields(SnapshotDescriptor& out, ByteSpan descriptor, std::uint64_t tableOffset,
+                 std::size_t recordBytes) {
   const auto count = loadLittle32(descriptor, tableOffset);
   const auto entries = count ? slice(descriptor, tableOffset + kTableHeaderBytes,
                                      std::uint64_t{*count} * kEntryBytes)
@@ -72,13 +82,13 @@ Status addFields(SnapshotDescriptor& out, ByteSpan descriptor, std::uint64_t tab
     return Error{"there are records but no fields"};
   }
   out.presenceOffset = *loadLittle32(*entries, kEntryOffset);
-  if (std::uint64_t{out.presenceOffset} + 4 > out.stride) {
-    return Error{
-        format("field 0 begins at byte %u of a record of %zu", out.presenceOffset, out.stride)};
+  if (Status present = checkRead(out, recordBytes, 0, out.presenceOffset, 4); !present) {
+    return present;
   }
   out.fields.reserve(*count);
   for (std::size_t i = 0; i < *count; ++i) {
-    const Status added = addField(out, entries->subspan(i * kEntryBytes, kEntryBytes), i);
+    const Status added =
+        addField(out, entries->subspan(i * kEntryBytes, kEntryBytes), i, recordBytes);
     if (!added) return added;
   }
   return Done{};
@@ -96,15 +106,11 @@ Expected<SnapshotDescriptor> readSnapshotDescriptor(ByteSpan descriptor, std::si
                          .count = *loadLittle32(descriptor, kRecordCount),
                          .presenceOffset = 0,
                          .fields = {}};
-  if (std::uint64_t{out.stride} * out.count > recordBytes) {
-    return Error{format("%zu records of %zu bytes are more than the buffer's %zu", out.count,
-                        out.stride, recordBytes)};
-  }
   if (*loadLittle32(descriptor, kVersion) >= kFirstVersionWithKey) {
     if (descriptor.size() > kKeyText) out.key = terminatedText(descriptor.subspan(kKeyText));
     if (!out.key) return Error{"the key has no zero byte"};
   }
-  const Status status = addFields(out, descriptor, *tableOffset);
+  const Status status = addFields(out, descriptor, *tableOffset, recordBytes);
   if (!status) return status.error();
   return out;
 }

@@ -31,18 +31,18 @@ namespace tavrel {
 /// A descriptor that can be trusted. Texts are borrowed from its bytes.
 struct SnapshotDescriptor {
   std::optional<std::string_view> key;  // printed in place of the usual key of the columns
-  std::size_t stride;                   // bytes of a record
-  std::size_t count;                    // of records, all of them in the buffer
+  std::size_t stride;                   // bytes from one record to the next
+  std::size_t count;                    // of records
   std::uint32_t presenceOffset;         // of the word that is 0 in an unused record
-  std::vector<SnapshotField> fields;    // that print something, all of them in the stride
+  std::vector<SnapshotField> fields;    // that print something
 };
 
-/// Checks a descriptor against itself and against the size of its records' buffer. A record takes
-/// its whole stride, the last one too, and a field lies within its record. Refused, with the
-/// reason, is what leaves these bounds, a text without its zero byte, a table without fields when
-/// there are records (the first field tells which are used), and a format that asks for other
-/// arguments than its kind gives: numbers for kinds 0 to 2, a text for kind 3, no widths. A format
-/// may take fewer arguments than there are.
+/// Checks a descriptor against itself and against the size of its records' buffer: whatever is read
+/// of any record must lie in the buffer. Records may overlap, and the last may be cut behind what
+/// is read of it. Refused, with the reason, is what leaves the buffer or the descriptor, a text
+/// without its zero byte, a table without fields when there are records (the first field tells
+/// which are used), and a format that asks for other arguments than its kind gives: numbers for
+/// kinds 0 to 2, a text for kind 3, no widths. A format may take fewer arguments than there are.
 Expected<SnapshotDescriptor> readSnapshotDescriptor(ByteSpan descriptor, std::size_t recordBytes);
 
 }  // namespace tavrel

@@ -18,7 +18,7 @@ constexpr LatencyRun kLatencyRuns[] = {
     {"M", "%5u", "/%5u"},  // maximum
 };
 
-// Every field lies in its record.
+// The descriptor was checked: every field lies in the buffer.
 std::uint32_t wordAt(ByteSpan record, std::uint64_t offset) {
   return *loadLittle32(record, offset);
 }

@@ -36,8 +36,11 @@ int ASPParseSnapshotBufferWithInplaceParser(ByteSpan records, std::span<char> te
   SnapshotWriter out(withinCapacity(text, textLength));
   if (!out.write(layout->key.value_or(kSnapshotColumnKey))) return 0;
   for (std::size_t i = 0; i < layout->count; ++i) {
-    const ByteSpan record = records.subspan(i * layout->stride, layout->stride);
-    if (loadLittle32(record, layout->presenceOffset) == 0U) continue;
+    const ByteSpan record = records.subspan(i * layout->stride);
+    if (loadLittle32(record, layout->presenceOffset) == 0U) {
+      if (layout->stride == 0) break;  // as all others are
+      continue;
+    }
     if (!out.writeLine(layout->fields, record)) return 0;
   }
   textLength = out.length();

@@ -17,12 +17,8 @@ TEST(Bytes, LoadsOnlyWhatLiesInside) {
   EXPECT_EQ(loadLittle16(bytes, 7), 0x09F8);
   EXPECT_EQ(loadLittle32(bytes, 1), 0x05040302U);
   EXPECT_EQ(loadLittle64(bytes, 0), 0xF807060504030201U);
-  EXPECT_EQ(loadBig16(bytes, 0), 0x0102);
-  EXPECT_EQ(loadBig32(bytes, 5), 0x0607F809U);
-  EXPECT_EQ(loadBig64(bytes, 1), 0x020304050607F809U);
   for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64}) {
     EXPECT_FALSE(loadByte(bytes, beyond));
-    EXPECT_FALSE(loadBig64(bytes, beyond));
   }
   EXPECT_FALSE(loadLittle16(bytes, 8) || loadLittle32(bytes, 6) || loadLittle64(bytes, 2));
   EXPECT_EQ(slice(bytes, 9, 0)->size(), 0U);
@@ -49,9 +45,6 @@ TEST(Arithmetic, IsDefinedAtTheEnds) {
   EXPECT_EQ(previousDay(std::numeric_limits<std::int32_t>::min()),
             std::numeric_limits<std::int32_t>::max());
   EXPECT_EQ(shiftLeft(1, 64), 0U);
-  EXPECT_EQ(shiftRight(kMax64, 4000), 0U);
-  EXPECT_EQ(checkedAdd(kMax64 - 1, 1), kMax64);
-  EXPECT_FALSE(checkedAdd(kMax64, 1));
   EXPECT_EQ(checkedMultiply(1UL << 32, (1UL << 32) - 1), kMax64 - (1UL << 32) + 1);
   EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
   EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);

@@ -100,12 +100,13 @@ TEST_F(BHConfigTest, LaterGroupsWinAndWrongTypesArePassedOver) {
 
 TEST_F(BHConfigTest, YieldsNothingForAFileThatCannotBeUsed) {
   EXPECT_FALSE(BHConfig::init(fake.platform));
-  EXPECT_EQ(fake.log.messages(LogLevel::Error), Messages{"Couldn't load whitelist"});
+  EXPECT_EQ(fake.log.messages(LogLevel::Error),
+            (Messages{"Couldn't load whitelist", "no such file"}));
 
   std::string& content = fake.files.contents[std::string(kWhitelistPath)];
   content = std::string(limits::kWhitelistBytes + 1, ' ');
   EXPECT_FALSE(BHConfig::init(fake.platform));
-  EXPECT_EQ(fake.log.messages(LogLevel::Error).back(), "Couldn't load whitelist");
+  EXPECT_EQ(fake.log.messages(LogLevel::Error).back(), "too large");
 
   content = "<plist><dict></plist>";
   EXPECT_FALSE(BHConfig::init(fake.platform));

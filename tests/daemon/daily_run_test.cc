@@ -137,6 +137,29 @@ TEST_F(DailyRunTest, ServesUntilASliceHasPassedWithoutAnEvent) {
   EXPECT_EQ(fake.log.messages()[1], "never received requested AAI, so moving along without it");
 }
 
+TEST_F(DailyRunTest, GoesOnBehindAnException) {
+  struct : DriverRegistry {
+    std::shared_ptr<DriverService> firstService(std::string_view) override {
+      throw std::bad_alloc();
+    }
+    KernelReturn matchingServices(const Dictionary&, std::unique_ptr<ServiceIterator>&) override {
+      throw std::bad_alloc();
+    }
+  } failing;
+  fake.drivers.behind = &failing;
+  fake.eventLoop.events = {[this] {
+    fake.state.appInfoRequested = true;
+    throw std::runtime_error("the message");
+  }};
+  run({"tavrel"});
+  EXPECT_EQ(fake.log.messages(),
+            (Messages{"tavrel started", "cannot go on serving: the message",
+                      "never received requested AAI, so moving along without it",
+                      "daily tasks for day 19999",
+                      "cannot finish the storage statistics: std::bad_alloc", "tavrel ended"}));
+  EXPECT_EQ(fake.journal, kGatedTasks);
+}
+
 TEST_F(DailyRunTest, EndsWithoutAFurtherRunWhenTheSystemSaysSo) {
   fake.state.appInfoRequested = true;
   fake.eventLoop.terminates = true;

@@ -1,5 +1,6 @@
 #include "daemon/tasking.h"
 
+#include <cmath>
 #include <gtest/gtest.h>
 
 #include "config/persisted_state.h"
@@ -99,10 +100,26 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
   EXPECT_EQ(fake.log.messages(), Messages{});
 }
 
+TEST_F(TaskingTest, AppliesNothingThatItCouldNotUndo) {
+  own = {{"LastOSUpdate", Dictionary{{"version", "21A5"}, {"day", 1}}}, {"TaskingID", "one"}};
+  using Case = std::pair<plist::Value, std::string>;
+  for (const auto& [value, why] :
+       {Case(plist::Date::sinceEpoch(std::nan("")),
+             "cannot encode the property list, value /TaskingPayload/0/Value: no calendar reaches "
+             "the date"),
+        Case(std::string(1 << 20, 'x'), "it needs 1048894 bytes and may have 1048576")}) {
+    schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", value)}}});
+    EXPECT_EQ(track(), Journal{});
+    EXPECT_EQ(fake.log.messages(),
+              Messages{"cannot apply ScheduledTasking of domain com.norvane.Drovelink: " + why +
+                       "; schedule one that preferences can hold"});
+  }
+}
+
 TEST_F(TaskingTest, SynchronisesEachDomainOnce) {
   own = {{"LastOSUpdate", Dictionary{{"version", "21A5"}, {"day", 1}}}};
   Array payload = Array::create();
-  for (int i = 0; i < 10000; ++i)
+  for (int i = 0; i < 5000; ++i)
     payload.append(setting(format("domain.%d", i % 1000).c_str(), format("%d", i).c_str(), i));
   schedule({{"TaskingID", "many"}, {"TaskingPayload", payload}});
   const Journal journal = track();

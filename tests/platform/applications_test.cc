@@ -67,6 +67,12 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   writeEntry("/home/ann/.local/share/applications/kde-mail.desktop", "Type=Application");
   writeEntry("/home/ann/.local/share/applications/removed.desktop",
              "Type=Application\nHidden=true");
+  writeEntry("/usr/share/applications/huge.desktop",
+             "Type=Application\nX=" + std::string(limits::kDesktopEntryBytes, 'x'));
+  writeEntry("/elsewhere/share/applications/foreign.desktop", "Type=Application");
+  std::filesystem::create_directory(device.root.path("/home/eve"));
+  std::filesystem::create_directory_symlink(device.root.path("/elsewhere"),
+                                            device.root.path("/home/eve/.local"));
   auto found = bundles();
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (Lines{"editor.desktop System", "kde-mail.desktop User", "tool.desktop User"}));
@@ -85,6 +91,12 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(log.lines, Lines{"cannot read " + states +
                              ": Invalid argument; packages that were installed "
                              "automatically count as installed by the user"});
+  const std::string packages = device.root.path("/var/lib/dpkg/status");
+  std::filesystem::rename(states, packages);
+  writeEntry("/usr/share/applications/tool.desktop", "Type=Application");
+  EXPECT_EQ(bundles(), Lines{"tool.desktop System"});
+  EXPECT_EQ(log.lines.back(),
+            "cannot read " + packages + ": Invalid argument; desktop entries are counted instead");
 }
 
 }  // namespace

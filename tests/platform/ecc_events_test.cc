@@ -72,6 +72,13 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   EXPECT_EQ(all(peek), "");
   EXPECT_EQ(device.queue(), before);
 
+  const auto lines = [&](const char* outcome) {
+    const std::string what = ": it is neither an event of 72 bytes nor an error number; ";
+    return std::vector{device.root.path(kQueue) + "03.event" + what + outcome,
+                       device.root.path(kQueue) + "04.errno" + what + outcome};
+  };
+  EXPECT_EQ(device.log.lines, lines("it would be set aside"));
+
   device.log.lines.clear();
   {
     LinuxSystemControls controls(device.root, device.files, device.coding, device.log);
@@ -86,13 +93,13 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   EXPECT_EQ(all(events), "errno 16; 2:; 3:; ");
   EXPECT_EQ(device.queue(),
             (std::vector<std::string>{"03.event.unusable", "04.errno.unusable", "notes"}));
-  const std::string what =
-      ": it is neither an event of 72 bytes nor an error number; it is set "
-      "aside";
-  EXPECT_EQ(device.log.lines, (std::vector{device.root.path(kQueue) + "03.event" + what,
-                                           device.root.path(kQueue) + "04.errno" + what}));
+  EXPECT_EQ(device.log.lines, lines("it is set aside"));
   device.event("00.event", 7);  // that arrives while the reader lives
   EXPECT_EQ(all(events), "7:; ");
+  device.write(std::string(kQueue) + "05.event", "short");
+  device.write(std::string(kQueue) + "05.event.unusable/in", "the way");
+  EXPECT_EQ(all(events), "");
+  EXPECT_TRUE(device.log.lines.back().ends_with("05.event.unusable: Is a directory"));
 }
 
 TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
@@ -118,6 +125,36 @@ TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
   EXPECT_EQ(all(second), "");
   device.count("ce_count", 3);  // the machine was started anew
   EXPECT_EQ(all(second), "1: 0 3 3; ");
+  EXPECT_TRUE(device.log.lines.empty());
+}
+
+TEST(EccEvents, AreKeptApartByBoots) {
+  EccDevice device;
+  const auto look = [&](const std::string& boot, std::uint64_t corrected, const char* uncorrected) {
+    device.write("/proc/sys/kernel/random/boot_id", boot + "-0000-4000-8000-000000000000\n");
+    device.count("ce_count", corrected);
+    device.write(std::string(kController) + "ue_count", uncorrected);
+    device.event("a.event", 8);
+    auto events = device.events();
+    std::array<std::byte, kEccEventBytes> first{};
+    EXPECT_EQ(events.next(first).errorNumber, 0);
+    EXPECT_EQ(first[0], std::byte{8});
+  };
+  // What was remembered before boots were is of this one.
+  device.write("/var/lib/tavrel/edac-counters.plist",
+               *device.coding.encodeXml(plist::Dictionary{{"mc0/ce_count", 3}}));
+  look("ffffffff", 5, "9");
+  look("00000000", 5, "?");
+  look("00000000", 7, "9");
+  const std::string before = "edac-mc0-ce_count-0000000001-FFFFFFFF-0000000000000000000";
+  const std::string after = "edac-mc0-ce_count-0000000002-00000000-0000000000000000000";
+  EXPECT_EQ(device.queue(),
+            (std::vector<std::string>{
+                before + "5.event", after + "5.event", after + "7.event",
+                "edac-mc0-ue_count-0000000001-FFFFFFFF-00000000000000000009.event",
+                "edac-mc0-ue_count-0000000002-00000000-00000000000000000009.event"}));
+  auto events = device.events();
+  EXPECT_EQ(all(events), "1: 0 2 5; 1: 0 5 5; 1: 0 2 7; 2: 0 9 9; 2: 0 9 9; ");
   EXPECT_TRUE(device.log.lines.empty());
 }
 

@@ -5,6 +5,7 @@
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded_snapshots.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -185,19 +186,18 @@ TEST(RecordedServices, KeepIdsCountsAndParents) {
                        node("Again", 4, {}, {{"top", "again"}}),
                        node("None", {}, kMost),
                        node("Last", kMost, -1, {{"own", 1}}),
-                       node("Real", 1.0, 1.0),
                        refusing};
   KeptLog log;
   RecordedRegistry registry({{"Services", services}}, log);
   EXPECT_EQ(log.lines, Lines{});
   std::string ids;
-  for (const char* className : {"First", "Again", "None", "Last", "Real", "Refusing"}) {
+  for (const char* className : {"First", "Again", "None", "Last", "Refusing"}) {
     std::uint64_t id = 7;
     const KernelReturn result = registry.firstService(className)->entryID(id);
     appendFormat(ids, "%s %x %llx, ", className, result, id);
   }
-  EXPECT_EQ(ids, format("First 0 1, Again 0 4, None %x 7, Last 0 %llx, Real %x 7, Refusing %x 7, ",
-                        kKernelNotFound, kMost, kKernelNotFound, kKernelAborted));
+  EXPECT_EQ(ids, format("First 0 1, Again 0 4, None %x 7, Last 0 %llx, Refusing %x 7, ",
+                        kKernelNotFound, kMost, kKernelAborted));
   EXPECT_EQ(log.lines, Lines{"recording: entry id 4 of a Again is that of an earlier Fourth, which "
                              "alone is found as a parent; give each service its own"});
 
@@ -215,9 +215,9 @@ TEST(RecordedServices, KeepIdsCountsAndParents) {
   EXPECT_EQ(search("First", "far") + search("First", "top") + search("Again", "top") +
                 search("None", "own"),
             "third fourth again 1 ");
-  EXPECT_EQ(search("First", "none") + search("First", "far", "IODeviceTree") +
-                search("Last", "other") + search("Real", "far"),
-            "(null) (null) (null) (null) ");
+  EXPECT_EQ(
+      search("First", "none") + search("First", "far", "IODeviceTree") + search("Last", "other"),
+      "(null) (null) (null) ");
 }
 
 TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
@@ -229,7 +229,6 @@ TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
                       row(8, {{"Request", dataOf({13, 0})}, {"Output", dataOf({1, 2, 3})}}),
                       row(8, {{"Selector", 0xFFFFFFFFU}, {"Error", kKernelError}}),
                       row(8, {{"OutputLength", 2}, {"Output", dataOf({5, 6, 7})}}),
-                      "no row",
                       row(9, {{"OutputLength", 4}, {"Output", dataOf({8})}}),
                       row(10, {{"OutputLength", -1}}),
                       row(11, {{"Scalars", Array{5, -1}}})};
@@ -264,6 +263,60 @@ TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
   EXPECT_EQ(client.client->close(), kKernelIOError);
   EXPECT_EQ(client.client->close(), kKernelBadArgument);
   EXPECT_EQ(client.call(11), kKernelBadArgument);
+}
+
+TEST(RecordedRegistryTest, LeavesOutWhatIsMalformed) {
+  const char* const integer = "an integer";
+  const char* const integers = "an array of integers";
+  const char* const data = "data, in JSON {\"$data\": \"BASE64\"}";
+  using Slips = std::vector<std::tuple<const char*, Value, const char*>>;
+  Lines lines{"\"Generation\" is left out: it must be an integer"};
+  Array services = Array::create(), rows = Array::create();
+  for (const auto& [key, value, must] : Slips{{"OpenError", "0xE00002BC", integer},
+                                              {"EntryID", 1.0, integer},
+                                              {"Methods", Dictionary::create(), "an array"}}) {
+    lines.push_back(
+        format("service %zu is left out: its \"%s\" must be %s", services.size(), key, must));
+    services.append(service("A", {{key, value}}));
+  }
+  for (const auto& [key, value, must] : Slips{{"Method", "8", integer},
+                                              {"Request", "0D00", data},
+                                              {"Selector", 1.5, integer},
+                                              {"Flags", true, integer},
+                                              {"Error", "0xE00002BC", integer},
+                                              {"Output", "AQID", data},
+                                              {"OutputLength", "4", integer},
+                                              {"Scalars", 5, integers},
+                                              {"Scalars", Array{5, "6"}, integers}}) {
+    lines.push_back(
+        format("row %zu of the \"Methods\" of service 3 is left out: its \"%s\" must be %s",
+               rows.size(), key, must));
+    rows.append(Dictionary{{"Method", 8}});
+    rows.at(rows.size() - 1).dictionary().set(key, value);
+  }
+  lines.insert(lines.end(),
+               {"row 9 of the \"Methods\" of service 3 is left out: it has no \"Method\"; "
+                "give the number of the method",
+                "\"Channels\" of the hub is left out: it must be an array",
+                "\"0\" of the hub's \"MethodErrors\" is left out: it must be an integer"});
+  rows.append("no row");
+  rows.append(Dictionary{{"Method", 8}, {"Output", dataOf({7})}});
+  services.append(service("B", {{"Methods", rows}}));
+  const Dictionary errors{{"0", "0xE00002CA"}, {"2", 6}};
+  KeptLog log;
+  RecordedRegistry registry({{"Generation", "7"},
+                             {"Services", services},
+                             {"Hub", Dictionary{{"Channels", 5}, {"MethodErrors", errors}}}},
+                            log);
+  EXPECT_EQ(walk(registry), "B IOReportHub ");
+  for (std::string& line : lines)
+    line.insert(0, "recording: ");
+  EXPECT_EQ(log.lines, lines);
+  Client driver(registry, "B"), client(registry);
+  EXPECT_EQ(driver.call(8, {}, {}, 0, 2), kKernelSuccess);
+  EXPECT_EQ(hexOf(driver.output), "07ee");
+  EXPECT_EQ(client.call(0), kKernelSuccess);
+  EXPECT_EQ(client.call(2), 6U);
 }
 
 Dictionary exampleHub() {
@@ -384,7 +437,7 @@ TEST(ReportHub, RefusesWhatTheRecordingRefuses) {
   Client client(registry);
   ASSERT_EQ(client.subscribe(interests(1, {{1, 1}})), kKernelSuccess);
   EXPECT_EQ(client.update(), "1/1*1=4 ");
-  ASSERT_EQ(log.lines.size(), 8U);
+  ASSERT_EQ(log.lines.size(), 9U);
   const std::string channel = "recording: hub channel ";
   EXPECT_EQ(log.lines[4], channel +
                               "4 is left out: its \"Elements\" are no groups of it; give elements "
@@ -395,6 +448,8 @@ TEST(ReportHub, RefusesWhatTheRecordingRefuses) {
   EXPECT_EQ(log.lines[7], channel +
                               "8 is left out: an earlier one has its ids; give each channel of a "
                               "driver its own");
+  EXPECT_EQ(log.lines[8],
+            "recording: \"MethodErrors\" of the hub is left out: it must be a dictionary");
   RecordedRegistry empty(Dictionary::create(), log);
   EXPECT_EQ(empty.firstService("IOReportHub"), nullptr);
 }
@@ -450,6 +505,19 @@ TEST_F(RecordingFolderTest, FollowsItsFiles) {
   });
   EXPECT_EQ(aborted, "p !");
   EXPECT_EQ(walk(player), "p T ");
+}
+
+TEST_F(RecordingFolderTest, HoldsASnapshot) {
+  const auto snapshot = RecordedSnapshots(device.root, files, log).create();
+  EXPECT_FALSE(snapshot->capture());
+  EXPECT_EQ(log.lines, Lines{});
+  device.write("/var/lib/tavrel/registry/stack-snapshot.bin", "bytes");
+  EXPECT_TRUE(snapshot->capture());
+  EXPECT_EQ(asText(*snapshot->buffer()), "bytes");
+  std::filesystem::resize_file(path("stack-snapshot.bin"), limits::kDeviceAllocationBytes + 1);
+  EXPECT_FALSE(snapshot->capture());
+  EXPECT_EQ(log.lines, Lines{"cannot use " + path("stack-snapshot.bin") +
+                             ": it has more than 67108864 bytes; move it away"});
 }
 
 TEST_F(RecordingFolderTest, IsOneRecordingThatPlaysTheSame) {

@@ -164,7 +164,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
     const ServiceClient client = connect();
     sendRaw(client, asBytes(packet), files);
     sendRaw(client, goodBytes);
-    EXPECT_EQ(drain(), 1) << "only the new peer is an event";
+    EXPECT_EQ(drain(), 2) << "the peer and its end";
     ASSERT_EQ(log.lines.size(), 1U);
     EXPECT_TRUE(log.says(std::string(kName) + ": dropped peer " + std::to_string(getpid()) +
                          " (user " + std::to_string(getuid()) + "): "));
@@ -236,12 +236,12 @@ TEST_F(ServiceTest, SilentPeersStopCountingAsEvents) {
     }
     return events;
   };
-  EXPECT_EQ(silentEvents(), limits::kSilentConnections);
+  EXPECT_EQ(silentEvents(), 2 * limits::kSilentConnections) << "beginnings and ends";
   EXPECT_EQ(silentEvents(), 0);
   EXPECT_EQ(peers, 4 * limits::kSilentConnections) << "they are served all the same";
   ASSERT_TRUE(connect().send({{"operation", 0}}));
   EXPECT_EQ(drain(), 2) << "a message, and the closure of the peer that sent it";
-  EXPECT_EQ(silentEvents(), limits::kSilentConnections);
+  EXPECT_EQ(silentEvents(), 2 * limits::kSilentConnections);
 }
 
 TEST_F(ServiceTest, RefusesOtherUsers) {

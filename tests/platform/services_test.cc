@@ -78,6 +78,10 @@ TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
                "<key>ProductVersion</key><integer>4</integer>"
                "<key>ProductBuildVersion</key><string>16R349</string></dict></plist>");
   EXPECT_EQ(device.version.text(), "Pellio (16R349)");
+  Services damaged;
+  damaged.write("/usr/lib/os-release", "VERSION_ID=1\n");
+  damaged.write("/etc/tavrel/system-version.plist", "<plist");
+  EXPECT_EQ(damaged.version.text(), "unknown");
 }
 
 TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {

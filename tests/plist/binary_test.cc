@@ -161,7 +161,7 @@ TEST(Binary, HostileTrailersAreRefused) {
 }
 
 TEST(Binary, ContentThatIsReferredToManyTimesIsLimited) {
-  // One mebibyte of data, referred to 65 times.
+  // One mebibyte of data, or of text, referred to 65 times.
   std::string bytes = "bplist00\xAF\x10\x41"s + std::string(65, '\1') + "\x4F\x12\x00\x10\x00\x00"s;
   const std::size_t data = 8 + 3 + 65;
   bytes += std::string(std::size_t{1} << 20, 'x');
@@ -170,9 +170,13 @@ TEST(Binary, ContentThatIsReferredToManyTimesIsLimited) {
   bytes += "\0\0\0\0\0\0\0\2\0\0\0\0\0\0\0\0\0\0\0\0\0"s;
   for (const unsigned shift : {16U, 8U, 0U})
     bytes += static_cast<char>(table >> shift & 0xFF);
-  EXPECT_EQ(errorOf(bytes),
-            "binary property list, offset 76: texts and data, after shared references are "
-            "expanded, are more than 67108864 bytes");
+  for (const char marker : {'\x4F', '\x5F'}) {
+    bytes[data] = marker;
+    EXPECT_EQ(errorOf(bytes),
+              "binary property list, offset 76: texts and data, after shared references are "
+              "expanded, are more than 67108864 bytes");
+  }
+  EXPECT_FALSE(writeBinary(Dictionary{{std::string(33 << 20, 'k'), std::string(33 << 20, 'k')}}));
 }
 
 TEST(Coding, RecognisesTheEncodingByContent) {

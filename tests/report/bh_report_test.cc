@@ -131,7 +131,8 @@ TEST_F(BHReportTest, WritesNothingWhenNothingWasCollected) {
   fake.files.contents.clear();
   fake.store.scalars = {{"raw", kDay, 1}};
   EXPECT_FALSE(write());
-  EXPECT_EQ(fake.log.messages(LogLevel::Error), Messages{"Couldn't load whitelist"});
+  EXPECT_EQ(fake.log.messages(LogLevel::Error),
+            (Messages{"Couldn't load whitelist", "no such file"}));
   EXPECT_EQ(fake.journal, fakes::Journal{});
 }
 

@@ -100,7 +100,7 @@ TEST(ParserTest, KnowsAllStatistics) {
 
   for (int i = 0; i < 2; ++i) {
     ASPReleaseContext(context);
-    EXPECT_TRUE(listed(context).empty() && context.arena.empty() && !context.values.head);
+    EXPECT_TRUE(listed(context).empty() && !context.names.head && !context.values.head);
     EXPECT_EQ(context.driverVersion + context.hostWrites + context.readCountHisto[0], 0U);
   }
 

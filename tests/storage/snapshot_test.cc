@@ -113,6 +113,20 @@ TEST(Snapshot, PrintsFieldsByKindAndLeavesUnusedRecordsOut) {
     const std::string by = descriptor(6, 28, 2, fields, "%s%n ");
     EXPECT_EQ(render(records, &by), std::string("%s%n ") + text);
   }
+
+  // Records that overlap, lie on each other, and end before what is not read of them.
+  const std::tuple<std::uint32_t, std::uint32_t, std::vector<Field>, const char*> placed[] = {
+      {4, 3, {{0, 0, 0, "%u "}, {0, 4, 0, "%u"}}, "1 2\n2 0\n"},
+      {0, 2, {{0, 4, 0, "%u"}}, "2\n2\n"},
+      {0, kMost, {{0, 8, 0, "%u"}}, ""},
+      {256,
+       1,
+       {{0, 0, 0, "%u"}, {1, 999, 0, ""}, {3, kMost, 11, "%s"}, {4, kMost, 0, ""}},
+       "1OLM\n"}};
+  for (const auto& [stride, count, fields, text] : placed) {
+    const std::string by = descriptor(6, stride, count, fields, "");
+    EXPECT_EQ(render(words({1, 2, 0, 3}), &by), text);
+  }
 }
 
 TEST(Snapshot, RefusesDescriptorsThatBreakALimit) {
@@ -123,15 +137,19 @@ TEST(Snapshot, RefusesDescriptorsThatBreakALimit) {
   const auto asks = [](std::string_view text, int kind) {
     return format("the format \"%s\" of field 1 asks for what kind %d does not give", text, kind);
   };
+  const auto beyond = [](int field, std::uint32_t count, std::uint64_t end) {
+    return format("field %d of the last of %u records ends at byte %llu of a buffer of 24", field,
+                  count, end);
+  };
   const std::vector<Field> one{{1, 0, 0, "%u"}};
   const std::pair<std::string, std::string> cases[] = {
       {of(1, 8, 0, "%4096u"), ""},
       {of(3, 0, 23, "O"), ""},
       {descriptor(kMost, 28, 0, {}, "no field, no record"), ""},
-      {of(1, 9, 0, ""), "field 1 ends at byte 13 of a record of 12"},
-      {of(2, kMost, 0, ""), "field 1 ends at byte 4294967299 of a record of 12"},
-      {of(3, 0, 24, ""), "field 1 ends at byte 24 of a record of 12"},
-      {of(3, kMost, kMost, ""), "field 1 ends at byte 8589934587 of a record of 12"},
+      {of(1, 9, 0, "%u"), beyond(1, 2, 25)},
+      {of(2, kMost, 0, "%u"), beyond(1, 2, 12 + 4294967299)},
+      {of(3, 1, 12, ""), beyond(1, 2, 25)},
+      {of(3, kMost, kMost, ""), beyond(1, 2, 12 + 8589934587)},
       {of(1, 0, 0, "sixteen bytes: %"), "the format of field 1 has no zero byte"},
       {of(1, 0, 0, "%99999999u"), asks("%99999999u", 1)},
       {of(1, 0, 0, "%n"), asks("%n", 1)},
@@ -140,10 +158,9 @@ TEST(Snapshot, RefusesDescriptorsThatBreakALimit) {
       {of(1, 0, 0, "100 %"), asks("100 %", 1)},
       {of(2, 0, 0, "%*d"), asks("%*d", 2)},
       {of(3, 0, 0, "%u"), asks("%u", 3)},
-      {descriptor(6, 4, 1, {{5, 1, 0, ""}}), "field 0 begins at byte 1 of a record of 4"},
-      {descriptor(6, 0, kMost, one), "field 0 begins at byte 0 of a record of 0"},
-      {descriptor(6, kMost, kMost, one),
-       "4294967295 records of 4294967295 bytes are more than the buffer's 24"},
+      {descriptor(6, 4, 1, {{5, 21, 0, ""}}), beyond(0, 1, 25)},
+      {descriptor(6, 10, 4, one), beyond(0, 4, 34)},
+      {descriptor(6, kMost, kMost, one), beyond(0, kMost, 18446744060824649734U)},
       {descriptor(6, 4, 1, {}), "there are records but no fields"},
       {descriptor(5, 4, 1, one, "", 34),
        "the field table at byte 34 ends beyond the descriptor's 69 bytes"},

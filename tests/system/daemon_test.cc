@@ -175,6 +175,24 @@ TEST(DaemonTest, RunsOnceADayAndByForce) {
   EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
 }
 
+TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
+  for (const bool areClosed : {true, false}) {
+    const Device device;
+    const int daemon = forkProcess([&] {
+      int gone[2];  // a pipe whose reader has gone
+      if (::pipe(gone) != 0 || ::close(gone[0]) != 0) ::_exit(126);
+      for (const int stream : {0, 1, 2})
+        areClosed ? ::close(stream) : ::dup2(gone[1], stream);
+      ::close(gone[1]);
+      device.execute("-d");
+    });
+    EXPECT_EQ(waitFor(daemon), 0);
+    EXPECT_EQ(device.preference(kTavrelDomain, kLastRunDayKey), plist::Value(device.yesterday));
+    EXPECT_EQ(device.pendingLogs().size(), 1U);
+    EXPECT_EQ(device.eccEvents(), kEccEvents);
+  }
+}
+
 /// A listening socket as the service manager would hand it over.
 int listeningSocket(const DeviceRoot& root) {
   const std::filesystem::path path = root.path("/run/tavrel/com.norvane.tallied.tavrel.socket");

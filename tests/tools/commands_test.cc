@@ -23,6 +23,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       "such bytes as --plist '{\"$data\": \"BASE64\"}'\n";
   const std::pair<std::vector<std::string>, std::string> kCases[] = {
       {{}, "tavrelctl: A subcommand is required: see 'tavrelctl --help'\n"},
+      {{"frob", "x"}, "tavrelctl: no subcommand 'frob': see 'tavrelctl --help'\n"},
+      {{"log", "frob"}, "tavrelctl: no subcommand 'frob': see 'tavrelctl log --help'\n"},
       {{"log"}, "tavrelctl: A subcommand is required: see 'tavrelctl log --help'\n"},
       {{"prefs", "get", "a"}, "tavrelctl: KEY is required: see 'tavrelctl prefs get --help'\n"},
       {{"prefs", "get", "../a", "k"},
@@ -208,9 +210,11 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   EXPECT_EQ(device.files(), before);
 
   std::filesystem::remove(device.path(kWhitelistFile));
-  EXPECT_EQ(device.run({"log", "preview", "--day", "20000"}).error,
-            "tavrelctl: no log would be submitted for day 20000 (2024-10-04): Couldn't load "
-            "whitelist\n");
+  EXPECT_EQ(
+      device.run({"log", "preview", "--day", "20000"}).error,
+      "tavrelctl: Couldn't load whitelist\ntavrelctl: no log would be submitted for day 20000 "
+      "(2024-10-04): cannot read " +
+          device.path(kWhitelistFile) + ": No such file or directory\n");
 
   fill(device);
   const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";

@@ -151,7 +151,7 @@ Changes of the system, and tasking
   reads preference com.norvane.Drovelink ScheduledTasking: none
 
 Roll-over of the support log
-  would roll the support log, unless it is empty
+  would roll nothing: the support log is empty or not there
 
 In all it would write: 3 preferences, 17 scalars, 4 structured records, 2 logs
 --verbose shows everything, and what logs hold.
@@ -183,7 +183,7 @@ TEST(Rehearse, GatedRunStopsWhereItsDayIsDone) {
   const Rehearsed device;
   EXPECT_NE(device.text({}).find(R"(
 Roll-over of the support log
-  would roll the support log, unless it is empty
+  would roll nothing: the support log is empty or not there
 
 End of the gated run
   would checkpoint the statistics store

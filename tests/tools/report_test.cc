@@ -184,6 +184,30 @@ TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
     "in_transitions": -6, "residency": -6, "duty_cycle": 1.0, "current": false}])"));
 }
 
+TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
+  const Dictionary recorded = recording();
+  std::vector<std::byte> unset(64);
+  storeLittle64(unset, 0, 0x100000201);
+  storeLittle64(unset, 8, 0x486F73745264);
+  storeLittle64(unset, 16, 0x100000001);
+  storeLittle64(unset, 32, std::uint64_t{1} << 63);
+  recorded.dictionary("Hub")
+      .array("Channels")
+      .at(0)
+      .dictionary()
+      .set("Elements", Array{plist::Data(unset)});
+  play(recorded);
+  const Outcome outcome = device.run({"report", "sample", "--group", "NAND", "--category", "1",
+                                      "--delta", "--interval", "0", "--format", "simple"});
+  EXPECT_EQ(outcome.status, 0);
+  EXPECT_EQ(outcome.error,
+            "tavrelctl: 1 channel without a change that can be told, left out; the first is flash0 "
+            "<id 0x100000201> NAND Traffic Host reads: a value is not set, or their number "
+            "changed\n");
+  EXPECT_EQ(outcome.out.substr(0, outcome.out.find_last_of(' ')),
+            "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  256 ");
+}
+
 TEST_F(ReportTest, DescribesInTheSystemsWords) {
   EXPECT_EQ(device.run({"report", "describe", "--group", "Power"}),
             prints("flash0 <id 0x100000201> Power state < 0x5077725374 (24Mticks) | G/g "
@@ -224,7 +248,9 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
             ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
             "registry list' shows the drivers and the hub");
   check(forgetful, {"sample"}, 0, "1 channel without values: the hub does not know them");
-  check(badLegend, {"list"}, 0, "radio0 <id 0x100000202>: bad legend");
+  check(badLegend, {"list"}, 0,
+        "radio0 <id 0x100000202>: bad legend\ntavrelctl: such drivers are left out: 'tavrelctl "
+        "registry show ID' shows what they publish");
   check(noHub, {"sample", "--group", "None"}, 1,
         "no such channel is published: 'tavrelctl report list' shows what there is");
   const std::string help = ": see 'tavrelctl report list --help'";

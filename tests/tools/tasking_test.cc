@@ -90,6 +90,19 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
   const std::string none = device.path("/none");
   EXPECT_EQ(run({"schedule", none}), fails("cannot read " + none + ": No such file or directory"));
   EXPECT_TRUE(run({"show"}).out.starts_with("Scheduled tasking: none\n"));
+
+  EXPECT_EQ(run({"schedule", device.path("/")}),
+            fails("cannot read " + device.path("/") +
+                  ": it is a folder: give a file, or - for standard input"));
+  device.write("/var/mobile/Library/Preferences/com.norvane.Drovelink.plist", "{}");
+  for (const std::vector<std::string>& unreadable :
+       {std::vector<std::string>{"show"}, {"show", "--json"}, {"clear"}}) {
+    EXPECT_EQ(run(unreadable),
+              fails("cannot read preferences " +
+                    device.path("/var/mobile/Library/Preferences/com.norvane.Drovelink.plist") +
+                    ": not a property list: it begins neither with \"bplist00\" nor with \"<\"; "
+                    "mend it, or the next write sets it aside"));
+  }
 }
 
 }  // namespace

@@ -1,4 +1,4 @@
-// For destructors that still have work to do.
+// For work whose failure must not stop what comes behind it, such as that of destructors.
 #pragma once
 
 #include <exception>
@@ -7,10 +7,9 @@
 
 namespace tavrel {
 
-/// Runs `action` and logs what it throws: an exception that left a destructor would end the process
-/// in the middle of its other work.
+/// Runs `action` and logs what it throws, for want of memory most likely, as "cannot WHAT: reason".
 template <class Action>
-void endGuarded(SystemLog& log, const char* what, Action action) noexcept {
+void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
   try {
     try {
       action();
