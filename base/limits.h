@@ -106,7 +106,7 @@ inline constexpr std::size_t kDesktopEntries = 100'000;
 /// Files and folders that are looked at for desktop entries. Users put what they like into theirs.
 inline constexpr std::size_t kDesktopFiles = 1'000'000;
 
-/// Bytes of a desktop entry. One with translations for every language stays below 100 kB.
+/// Bytes of a desktop entry, which has some lines of text in as many languages as there may be.
 inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 
 /// Languages in one list. Matching compares every preferred with every available one; the system's

@@ -12,8 +12,7 @@
 //
 // What counts as an event, and so makes the wait for the next one begin anew:
 //   - a message, whatever it says;
-//   - a new peer, and its end, by itself or because it was dropped. Of new peers in a row, without
-//   a
+//   - a new peer, and its end, by itself or because it was dropped. Of new peers in a row, with no
 //     message from anybody in between, only the first `limits::kSilentConnections` count; further
 //     ones are served, but the wait goes on;
 //   - the end of a peer that has sent a message.

@@ -25,7 +25,8 @@
 namespace tavrel::plist {
 
 /// Fails for a value that is or contains null, a date that no calendar reaches (not a number, or
-/// more than 10^9 years off), and for what the limits of base/limits.h would not let back in.
+/// more than 10^9 years off), and for what nests too deeply or is too long to be read back. More
+/// values than `readXml` takes are no failure: a large log is better written than lost.
 Expected<std::string> writeXml(const Value& value);
 
 /// The value is the caller's own. Want of memory is no error of the document, which may be whole:
