@@ -63,8 +63,8 @@ inline constexpr std::size_t kSystemFactBytes = 64U << 10;
 /// How long the lock of a file that another process writes is waited for, in milliseconds.
 inline constexpr int kFileLockMilliseconds = 10'000;
 
-/// Bytes of a key in the statistics store. Keys are names, far shorter than this; a row with one
-/// is read whole, so that nobody's key may decide how much memory that costs.
+/// Bytes of a key in the statistics store. Keys are names, far shorter than this. A row is read
+/// whole with its key: without a limit whoever wrote the key would decide how much memory it takes.
 inline constexpr std::size_t kStoreKeyBytes = 1U << 20;
 
 /// Age after which a temporary file that a killed process left behind is removed, in seconds.

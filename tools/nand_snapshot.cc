@@ -13,8 +13,9 @@ namespace {
 constexpr std::size_t kCharactersPerByte = 4;
 constexpr std::size_t kCharactersOfKey = 4096;
 
-// Formats of a device may widen every field to a page.
-constexpr std::size_t kLongestText = 1U << 30;
+// Formats of a device may widen every field to a page, and its records may lie on each other. The
+// whole text of the largest buffer of the fixed layout has its place.
+constexpr std::size_t kLongestText = 320U << 20;
 
 class Taken final : public StackSnapshot {
  public:

@@ -33,7 +33,7 @@ void show(ToolContext& context, const Arguments& arguments) {
 Expected<std::string> encode(const plist::Value& value, const std::string& form) {
   if (form == "binary") return plist::writeBinary(value);
   if (form == "xml") return plist::writeXml(value);
-  return jsonOf(value).dump(2, ' ', false, Json::error_handler_t::replace) + '\n';
+  return jsonText(jsonOf(value), 2) + '\n';
 }
 
 void convert(ToolContext& context, const Arguments& arguments) {

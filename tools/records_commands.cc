@@ -19,6 +19,7 @@
 #include "platform/linux/record_files.h"
 #include "tools/day_argument.h"
 #include "tools/folder_watch.h"
+#include "tools/json_list.h"
 #include "tools/record_reader.h"
 #include "tools/table.h"
 
@@ -114,12 +115,10 @@ class RecordsView {
   }
 
   void begin() {
-    if (isDocument()) {
-      context_.out() << "{\n  \"format_version\": " << kJsonFormatVersion << ",\n  \"records\": [";
-    }
+    if (context_.json() && !follows_) document_.emplace(context_.out(), Json::object(), "records");
   }
   void end() {
-    if (isDocument()) context_.out() << (hasPrinted_ ? "\n  ]\n}\n" : "]\n}\n");
+    if (document_) document_->end();
   }
 
  private:
@@ -128,8 +127,6 @@ class RecordsView {
     std::string type;
     std::string text;
   };
-
-  bool isDocument() const { return context_.json() && !follows_; }
 
   void readFile(const RecordFile& file, std::vector<Row>& rows) {
     auto [reader, isNew] = readers_.try_emplace(file.path, file.path);
@@ -159,12 +156,11 @@ class RecordsView {
     for (Row& row : rows) {
       if (!context_.json()) {
         table.add({std::move(row.time), std::move(row.type), std::move(row.text)});
-      } else if (follows_) {
-        out << row.text << '\n';
+      } else if (document_) {
+        document_->addText(row.text);
       } else {
-        out << (hasPrinted_ ? ",\n    " : "\n    ") << row.text;
+        out << row.text << '\n';
       }
-      hasPrinted_ = true;
     }
     if (!table.empty()) table.print(out, context_.columns());
   }
@@ -186,7 +182,7 @@ class RecordsView {
   std::set<std::string> told_;
   std::uint64_t faults_ = 0;
   std::string firstFault_;
-  bool hasPrinted_ = false;
+  std::optional<JsonList> document_;
 };
 
 void show(ToolContext& context, const Selection& selection, bool follows) {

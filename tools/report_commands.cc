@@ -97,7 +97,11 @@ void list(ToolContext& context, const Arguments& arguments) {
   NotingPlatform noting(context);
   const auto channels = selectedChannels(context, noting, arguments.selection);
   if (!channels) return context.fail(channels.error().message);
-  if (context.json()) return context.printJson({{"channels", channelsJson(*channels)}});
+  if (context.json()) {
+    JsonList list(context.out(), Json::object(), "channels");
+    addChannels(list, *channels);
+    return list.end();
+  }
   if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
   printChannels(context.out(), *channels, arguments.flat, context.columns());
 }
@@ -105,15 +109,12 @@ void list(ToolContext& context, const Arguments& arguments) {
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
               std::uint32_t number, std::int32_t missing) {
   if (context.json()) {
-    Json document = {{"sample", number},
-                     {"delta", arguments.delta},
-                     {"missing", missing},
-                     {"channels", samplesJson(samples, arguments.delta)}};
-    if (arguments.count == 1) return context.printJson(std::move(document));
     // Of several each is one line, so that readers can tell where one ends.
-    Json line = {{"format_version", kJsonFormatVersion}};
-    line.update(document);
-    context.out() << line.dump(-1, ' ', false, Json::error_handler_t::replace) << '\n';
+    JsonList list(
+        context.out(), {{"sample", number}, {"delta", arguments.delta}, {"missing", missing}},
+        "channels", arguments.count == 1 ? JsonList::Layout::Document : JsonList::Layout::Line);
+    addSamples(list, samples, arguments.delta);
+    list.end();
   } else {
     if (number > 1) context.out() << '\n';
     if (arguments.count > 1) {

@@ -103,18 +103,14 @@ Json sampleJson(const plist::Dictionary& channel, bool isDelta) {
 
 }  // namespace
 
-Json channelsJson(const plist::Dictionary& channels) {
-  Json json = Json::array();
+void addChannels(JsonList& list, const plist::Dictionary& channels) {
   for (const plist::Dictionary& channel : channelsIn(channels))
-    json.push_back(channelJson(channel));
-  return json;
+    list.add(channelJson(channel));
 }
 
-Json samplesJson(const plist::Dictionary& samples, bool isDelta) {
-  Json json = Json::array();
+void addSamples(JsonList& list, const plist::Dictionary& samples, bool isDelta) {
   for (const plist::Dictionary& channel : channelsIn(samples))
-    json.push_back(sampleJson(channel, isDelta));
-  return json;
+    list.add(sampleJson(channel, isDelta));
 }
 
 }  // namespace tavrel

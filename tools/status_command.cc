@@ -42,8 +42,7 @@ DeviceStatus takeStatus(ToolContext& context) {
   DeviceStatus status;
   const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
       "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
-  const bool isUnknown = context.hasComplaints();
-  if (!isUnknown) status.submissionAllowed = isAllowed;
+  if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
   status.today = platform.statistics.BHDaysSince1970();
   bool hasRun = false;
   const auto lastDay =
@@ -53,7 +52,7 @@ DeviceStatus takeStatus(ToolContext& context) {
           context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
     status.osVersion = *version;
   }
-  status.isStateReadable = isUnknown || !context.hasComplaints();
+  status.isStateReadable = !context.hasComplaints();
   status.storePath = context.storeForReading().path();
   status.storeBytes = bytesOfStore(status.storePath);
   if (status.storeBytes) {

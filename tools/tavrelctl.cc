@@ -35,7 +35,8 @@ std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   const auto unknown = app.remaining(true);
   if (dynamic_cast<const CLI::RequiredError*>(&error) != nullptr && !unknown.empty() &&
       command->get_require_subcommand_min() > 0) {
-    fault = format("no subcommand '%s'", unknown.front());
+    const char* const what = unknown.front().starts_with('-') ? "option" : "subcommand";
+    fault = format("no %s '%s'", what, unknown.front());
   }
   return format("%s: see '%s --help'", fault, line);
 }

@@ -4,6 +4,7 @@
 #include <cstring>
 #include <ostream>
 #include <stdexcept>
+#include <utility>
 
 #include "base/format.h"
 #include "platform/linux/device_root.h"
@@ -15,6 +16,19 @@
 #include "tools/table.h"
 
 namespace tavrel {
+
+Json withFormatVersion(Json object) {
+  Json document = {{"format_version", kJsonFormatVersion}};
+  auto& members = document.get_ref<Json::object_t&>();
+  for (auto& [name, value] : object.get_ref<Json::object_t&>()) {
+    members.emplace_back(name, std::move(value));
+  }
+  return document;
+}
+
+std::string jsonText(const Json& value, int indent) {
+  return value.dump(indent, ' ', false, Json::error_handler_t::replace);
+}
 
 class ToolContext::NotingLog final : public SystemLog {
  public:
@@ -88,12 +102,7 @@ void ToolContext::addJsonOption(CLI::App& command) {
 }
 
 void ToolContext::printJson(Json object) {
-  Json document = {{"format_version", kJsonFormatVersion}};
-  auto& members = document.get_ref<Json::object_t&>();
-  for (auto& [name, value] : object.get_ref<Json::object_t&>()) {
-    members.emplace_back(name, std::move(value));
-  }
-  streams_.out << document.dump(2, ' ', false, Json::error_handler_t::replace) << '\n';
+  streams_.out << jsonText(withFormatVersion(std::move(object)), 2) << '\n';
 }
 
 void ToolContext::printLine(std::string_view message) {

@@ -39,6 +39,12 @@ using Json = nlohmann::ordered_json;
 /// or goes away; new members do not change it.
 inline constexpr int kJsonFormatVersion = 1;
 
+/// `object` led by the member "format_version".
+Json withFormatVersion(Json object);
+/// `value` as text, indented by so many spaces, or on one line for -1. Text in it that is no UTF-8
+/// is repaired.
+std::string jsonText(const Json& value, int indent);
+
 enum ExitStatus : int { kExitSuccess = 0, kExitFailure = 1, kExitUsage = 2 };
 
 /// Standard streams, and what is known of the terminal behind them.
@@ -92,7 +98,7 @@ class ToolContext {
   /// Adds `--json` to a subcommand that prints data.
   void addJsonOption(CLI::App& command);
   bool json() const { return json_; }
-  /// Prints `object`, led by the member "format_version". Text that is no UTF-8 is repaired.
+  /// Prints `object` as an indented document, led by the member "format_version".
   void printJson(Json object);
 
   // -- Ends --------------------------------------------------------------------------------------

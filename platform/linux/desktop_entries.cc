@@ -86,9 +86,10 @@ void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
     for (; !error && at != fs::recursive_directory_iterator(); at.increment(error)) {
       const std::string path = at->path().string();
       if (++visited > limits::kDesktopFiles) {
-        log.log(LogLevel::Error,
-                "more than %zu files beside the desktop entries; those from %s on do not count",
-                limits::kDesktopFiles, path);
+        log.log(
+            LogLevel::Error,
+            "more than %zu files and folders among desktop entries; those from %s on do not count",
+            limits::kDesktopFiles, path);
         return;
       }
       if (!path.ends_with(".desktop")) continue;

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/limits.h"
+#include "platform/plist/binary.h"
 
 namespace tavrel::plist {
 namespace {
@@ -91,6 +92,14 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
     deepest = Array{deepest};
   Array cyclic{1};
   cyclic.append(cyclic);
+  // A log of many values is better written than lost; in binary they are limited.
+  Array wide{1, 2, 3, 4, 5, 6, 7, 8};
+  for (int i = 0; i < 5; ++i)
+    wide = Array{wide, wide, wide, wide, wide, wide, wide, wide};
+  wide = Array{wide, wide, wide, wide};
+  EXPECT_TRUE(writeXml(wide));
+  EXPECT_EQ(writeBinary(wide).error().message,
+            "cannot encode the property list: it has more than 1000000 values");
   Array large;
   const std::string text(std::size_t{1} << 20, '&');
   for (int i = 0; i < 14; ++i)

@@ -24,6 +24,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const std::pair<std::vector<std::string>, std::string> kCases[] = {
       {{}, "tavrelctl: A subcommand is required: see 'tavrelctl --help'\n"},
       {{"frob", "x"}, "tavrelctl: no subcommand 'frob': see 'tavrelctl --help'\n"},
+      {{"log", "--frob"}, "tavrelctl: no option '--frob': see 'tavrelctl log --help'\n"},
       {{"log", "frob"}, "tavrelctl: no subcommand 'frob': see 'tavrelctl log --help'\n"},
       {{"log"}, "tavrelctl: A subcommand is required: see 'tavrelctl log --help'\n"},
       {{"prefs", "get", "a"}, "tavrelctl: KEY is required: see 'tavrelctl prefs get --help'\n"},

@@ -136,6 +136,19 @@ flash0 <id 0x100000201>
   Temperature
     Controller  -125  mC
 )"));
+  // Whatever is printed piece by piece looks as if it had been printed at once.
+  for (const auto& [arguments, indent] : {std::pair(std::vector<std::string>{"list"}, 2),
+                                          {{"list", "--group", "none"}, 2},
+                                          {{"sample"}, 2},
+                                          {{"sample", "--delta", "--interval", "0"}, 2},
+                                          {{"sample", "--count", "2", "--interval", "0"}, -1}}) {
+    auto line = arguments;
+    line.insert(line.begin(), "report");
+    line.push_back("--json");
+    const std::string text = device.run(line).out;
+    const std::string first = indent < 0 ? text.substr(0, text.find('\n') + 1) : text;
+    EXPECT_EQ(first, Json::parse(first).dump(indent) + '\n');
+  }
   const auto json =
       nlohmann::json::parse(device.run({"report", "sample", "--group", "NAND", "--json"}).out);
   EXPECT_EQ(json["format_version"], 1);
