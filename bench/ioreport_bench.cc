@@ -8,7 +8,7 @@
 
 #include "base/format.h"
 #include "ioreport/ioreport.h"
-#include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded/recorded_registry.h"
 
 namespace {
 

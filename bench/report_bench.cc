@@ -7,8 +7,8 @@
 #include <vector>
 
 #include "platform/linux/linux_platform.h"
-#include "platform/linux/sqlite_batch.h"
-#include "platform/linux/sqlite_store.h"
+#include "platform/linux/store/sqlite_batch.h"
+#include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/xml.h"
 #include "report/bh_report.h"
 #include "report/rounding.h"

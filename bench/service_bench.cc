@@ -8,9 +8,9 @@
 #include <string>
 #include <sys/socket.h>
 
-#include "platform/linux/service_client.h"
-#include "platform/linux/service_message.h"
-#include "platform/linux/socket_service.h"
+#include "platform/linux/service/service_client.h"
+#include "platform/linux/service/service_message.h"
+#include "platform/linux/service/socket_service.h"
 #include "platform/plist/binary.h"
 
 namespace tavrel {

@@ -8,7 +8,7 @@
 #include <string>
 
 #include "platform/linux/linux_platform.h"
-#include "platform/linux/sqlite_store.h"
+#include "platform/linux/store/sqlite_store.h"
 
 namespace {
 

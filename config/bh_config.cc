@@ -36,24 +36,24 @@ std::unique_ptr<BHConfig> BHConfig::init(Platform& platform) {
 }
 
 bool BHConfig::load() {
-  const auto bytes = platform_.files.read(kWhitelistPath, limits::kWhitelistBytes);
+  const auto bytes = platform_.files->read(kWhitelistPath, limits::kWhitelistBytes);
   if (!bytes) {
-    platform_.log.log(LogLevel::Error, "Couldn't load whitelist");
-    platform_.log.write(LogLevel::Error, bytes.error().message);
+    platform_.log->log(LogLevel::Error, "Couldn't load whitelist");
+    platform_.log->write(LogLevel::Error, bytes.error().message);
     return false;
   }
-  appendHex(_configFileDigest, platform_.digest.md5(asBytes(*bytes)));
+  appendHex(_configFileDigest, platform_.digest->md5(asBytes(*bytes)));
 
-  const auto whitelist = platform_.propertyLists.decode(asBytes(*bytes));
+  const auto whitelist = platform_.propertyLists->decode(asBytes(*bytes));
   if (!whitelist) {
-    platform_.log.log(LogLevel::Error, "Couldn't parse the contents of the config file. Error: %@",
-                      whitelist.error().message);
+    platform_.log->log(LogLevel::Error, "Couldn't parse the contents of the config file. Error: %@",
+                       whitelist.error().message);
     return false;
   }
   for (const plist::Entry& group : whitelist->dictionary()) {
     if (group.key == kInternalTestingGroup && !_isInternalDevice) continue;
     if (isSwitchedOff(group.key)) {
-      platform_.log.log(LogLevel::Default, "keyGroup %@ is disabled by tasking", group.key);
+      platform_.log->log(LogLevel::Default, "keyGroup %@ is disabled by tasking", group.key);
       continue;
     }
     loadGroup(group.value.dictionary());
@@ -66,7 +66,7 @@ bool BHConfig::load() {
 bool BHConfig::isSwitchedOff(std::string_view group) const {
   bool exists = false;
   const bool enabled =
-      platform_.preferences.ZTXPreferencesGetBoolValue(group, kTaskingSwitchDomain, &exists);
+      platform_.preferences->ZTXPreferencesGetBoolValue(group, kTaskingSwitchDomain, &exists);
   return exists && !enabled && !_isInternalDevice;
 }
 
@@ -90,11 +90,11 @@ plist::Dictionary BHConfig::optionsFor(std::string_view key, const plist::Dictio
                                        const PrefixTree& tree) const {
   if (const auto exact = keys.dictionary(key)) return exact;
   if (const auto prefix = tree.longestMatch(key)) {
-    platform_.log.log(LogLevel::Debug, "prefix match %@ for %@", *prefix, key);
+    platform_.log->log(LogLevel::Debug, "prefix match %@ for %@", *prefix, key);
     return prefixes.dictionary(*prefix);
   }
   if (_isInternalDevice) {
-    platform_.log.log(LogLevel::Debug, "passing @{} for %@ as device is Norvane Internal", key);
+    platform_.log->log(LogLevel::Debug, "passing @{} for %@ as device is Norvane Internal", key);
     return plist::Dictionary::create();
   }
   return {};

@@ -3,8 +3,8 @@
 namespace tavrel {
 
 bool BHIsInternalDevice(Platform& platform) {
-  auto& answer = platform.state.isInternalDevice;
-  if (!answer) answer = platform.deviceAnswers.SQGetBoolAnswer("InternalBuild");
+  auto& answer = platform.state->isInternalDevice;
+  if (!answer) answer = platform.deviceAnswers->SQGetBoolAnswer("InternalBuild");
   return *answer;
 }
 

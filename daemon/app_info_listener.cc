@@ -12,19 +12,19 @@ namespace {
 enum Operation : std::int32_t { kAnnounce = 0, kForceDay = 1, kDeliver = 2 };
 
 void deliver(Platform& platform, const plist::Array& appData) {
-  bool& requested = platform.state.appInfoRequested;
+  bool& requested = platform.state->appInfoRequested;
   const plist::Array appInfo = appInfoFrom(appData);
-  platform.log.log(LogLevel::Default, "tavrel got %sAAI:\n%@",
-                   requested ? "requested" : "(unsolicited -- so ignoring) ", appInfo);
+  platform.log->log(LogLevel::Default, "tavrel got %sAAI:\n%@",
+                    requested ? "requested" : "(unsolicited -- so ignoring) ", appInfo);
   if (!requested) return;
   runDailyIfNeeded(platform, appInfo);
   requested = false;
 }
 
 void announce(Platform& platform) {
-  platform.state.appInfoRequested = true;
-  platform.notifications.post(kLoggingNotification);
-  platform.log.log(LogLevel::Default, "notified of logging status, waiting for activate app info");
+  platform.state->appInfoRequested = true;
+  platform.notifications->post(kLoggingNotification);
+  platform.log->log(LogLevel::Default, "notified of logging status, waiting for activate app info");
 }
 
 /// The low half of an integer entry.
@@ -46,8 +46,8 @@ void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
   }
   const auto day = integerIn(message, "value");
   if (*operation == kForceDay && !day) return;
-  if (platform.state.clientRequestHandled) return;
-  platform.state.clientRequestHandled = true;
+  if (platform.state->clientRequestHandled) return;
+  platform.state->clientRequestHandled = true;
   switch (*operation) {
     case kAnnounce:
       announce(platform);
@@ -61,7 +61,7 @@ void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
 }
 
 std::unique_ptr<ServiceListener> startAppInfoListener(Platform& platform) {
-  auto listener = platform.namedServices.createListener(kAppInfoServiceName);
+  auto listener = platform.namedServices->createListener(kAppInfoServiceName);
   if (!listener) return nullptr;
   listener->setPeerHandler([&platform](PeerConnection& peer) {
     peer.setEventHandler(

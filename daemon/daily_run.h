@@ -5,15 +5,19 @@
 
 #include "base/plist.h"
 #include "platform/platform.h"
+#include "platform/step_observer.h"
 
 namespace tavrel {
 
 /// The gated run: does yesterday's tasks unless they are done, and remembers the day. `appInfo` is
-/// the list of activated applications, an empty handle when there is none.
-void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo);
+/// the list of activated applications, an empty handle when there is none. `onStep` hears of the
+/// gate, of each task, and of the end.
+void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo,
+                      const StepObserver& onStep = {});
 
 /// The tasks for one day, without the gate. No task's failure, not even an exception, stops the
-/// ones behind it.
-void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo);
+/// ones after it.
+void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
+                      const StepObserver& onStep = {});
 
 }  // namespace tavrel

@@ -30,13 +30,13 @@ void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
   bool isIdle = true;  // also when a message could not be handled to its end
   runGuarded(platform.log, "go on serving",
              [&] { isIdle = waitUntilIdle(platform.eventLoop, idleSlice); });
-  if (!isIdle || !platform.state.appInfoRequested) return;
-  platform.log.log(LogLevel::Default, "never received requested AAI, so moving along without it");
+  if (!isIdle || !platform.state->appInfoRequested) return;
+  platform.log->log(LogLevel::Default, "never received requested AAI, so moving along without it");
   runDailyIfNeeded(platform, plist::Array());
 }
 
 void runArgument(Platform& platform, const char* argument) {
-  const std::int32_t today = platform.statistics.BHDaysSince1970();
+  const std::int32_t today = platform.statistics->BHDaysSince1970();
   const std::string_view mode = argument;
   const plist::Array noAppInfo;
   if (mode == "-d") {
@@ -46,7 +46,7 @@ void runArgument(Platform& platform, const char* argument) {
   } else if (mode == "-t") {
     dailyTasksForDay(platform, today, noAppInfo);
   } else {
-    platform.log.log(LogLevel::Default, "Unknown arg: %s", argument);
+    platform.log->log(LogLevel::Default, "Unknown arg: %s", argument);
   }
 }
 
@@ -54,7 +54,7 @@ void runArgument(Platform& platform, const char* argument) {
 
 int runTavrel(Platform& platform, std::span<const char* const> arguments,
               std::chrono::milliseconds idleSlice) {
-  platform.log.log(LogLevel::Default, "tavrel started");
+  platform.log->log(LogLevel::Default, "tavrel started");
   runGuarded(platform.log, "finish the run", [&] {
     if (arguments.size() == 1) {
       serve(platform, idleSlice);
@@ -62,7 +62,7 @@ int runTavrel(Platform& platform, std::span<const char* const> arguments,
       runArgument(platform, arguments[1]);
     }
   });
-  platform.log.log(LogLevel::Default, "tavrel ended");
+  platform.log->log(LogLevel::Default, "tavrel ended");
   return 0;
 }
 

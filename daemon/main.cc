@@ -7,7 +7,7 @@
 
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
-#include "platform/linux/linux_system_log.h"
+#include "platform/linux/system_log/linux_system_log.h"
 
 namespace {
 

@@ -51,23 +51,23 @@ class Tracker {
  public:
   explicit Tracker(Platform& platform)
       : platform_(platform),
-        today_(platform.statistics.BHDaysSince1970()),
-        build_(platform.systemVersion.systemVersionDictionary().get(kProductBuildVersionKey)),
+        today_(platform.statistics->BHDaysSince1970()),
+        build_(platform.systemVersion->systemVersionDictionary().get(kProductBuildVersionKey)),
         lastUpdate_(own(kLastOSUpdateKey).dictionary()) {}
 
   void trackOSChange() {
     const plist::Value version = lastUpdate_.get("version");
     if (build_.isNull() || build_ == version) return;
-    platform_.log.log(LogLevel::Default, "OS change since last run (%{public}@ -> %{public}@)",
-                      version, build_);
+    platform_.log->log(LogLevel::Default, "OS change since last run (%{public}@ -> %{public}@)",
+                       version, build_);
     lastUpdate_ = {{"version", build_}, {"day", today_}};
-    platform_.preferences.ZTXPreferencesSetValue(kLastOSUpdateKey, lastUpdate_, kTavrelDomain);
+    platform_.preferences->ZTXPreferencesSetValue(kLastOSUpdateKey, lastUpdate_, kTavrelDomain);
   }
 
   /// False when no tasking is scheduled.
   bool trackTasking() {
     const plist::Dictionary scheduled =
-        platform_.preferences.ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)
+        platform_.preferences->ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)
             .dictionary();
     if (!scheduled.string(kTaskingIDKey)) return false;
 
@@ -79,33 +79,33 @@ class Tracker {
     if (!canBeRemembered(scheduled)) return true;
     PreferenceWriter writer(platform_.preferences);
     if (appliedID) {
-      platform_.log.log(LogLevel::Default,
-                        "Tasking update (%{public}@ -> %{public}@, %{public}@ -> %{public}@)",
-                        appliedID, newID, appliedOS, build_);
+      platform_.log->log(LogLevel::Default,
+                         "Tasking update (%{public}@ -> %{public}@, %{public}@ -> %{public}@)",
+                         appliedID, newID, appliedOS, build_);
       undo(writer);
     }
     apply(scheduled, writer);
     writer.synchronize();
-    platform_.notifications.post(kTaskingChanged);
+    platform_.notifications->post(kTaskingChanged);
     return true;
   }
 
   void submitAggressively() {
-    const auto value = platform_.submission.ZTXGetDATaskingValue(kAggressiveDaysValue).number();
+    const auto value = platform_.submission->ZTXGetDATaskingValue(kAggressiveDaysValue).number();
     const std::int32_t days = value ? value->int32() : 0;
     const auto updateDay = lastUpdate_.number("day");
     const std::int64_t sinceUpdate =
         std::abs(std::int64_t{today_} - (updateDay ? updateDay->int32() : 0));
     if (sinceUpdate >= days) return;
-    platform_.log.log(LogLevel::Default,
-                      "Aggressive submission day %d of %d; triggering log submission",
-                      static_cast<std::int32_t>(sinceUpdate), days);
-    platform_.submission.submitDiagnosticLogs();
+    platform_.log->log(LogLevel::Default,
+                       "Aggressive submission day %d of %d; triggering log submission",
+                       static_cast<std::int32_t>(sinceUpdate), days);
+    platform_.submission->submitDiagnosticLogs();
   }
 
  private:
   plist::Value own(std::string_view key) {
-    return platform_.preferences.ZTXPreferencesGetValue(key, kTavrelDomain);
+    return platform_.preferences->ZTXPreferencesGetValue(key, kTavrelDomain);
   }
 
   /// Says so when it cannot. Settings that are applied and not remembered could never be undone.
@@ -114,14 +114,14 @@ class Tracker {
     auto kept = plist::Dictionary::create();
     for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey})
       kept.set(key, scheduled.get(key));
-    const auto xml = platform_.propertyLists.encodeXml(kept);
+    const auto xml = platform_.propertyLists->encodeXml(kept);
     if (xml && xml->size() <= Preferences::kLargestChange) return true;
-    platform_.log.log(LogLevel::Error,
-                      "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
-                      kScheduledTaskingKey, kScheduleDomain,
-                      xml ? format("it needs %zu bytes and may have %zu", xml->size(),
-                                   Preferences::kLargestChange)
-                          : xml.error().message);
+    platform_.log->log(LogLevel::Error,
+                       "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
+                       kScheduledTaskingKey, kScheduleDomain,
+                       xml ? format("it needs %zu bytes and may have %zu", xml->size(),
+                                    Preferences::kLargestChange)
+                           : xml.error().message);
     return false;
   }
 

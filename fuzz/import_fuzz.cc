@@ -6,7 +6,7 @@
 #include <cstdlib>
 #include <string>
 
-#include "tools/import_lines.h"
+#include "tools/stat/import_lines.h"
 
 using namespace tavrel;
 

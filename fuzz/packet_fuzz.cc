@@ -11,8 +11,8 @@
 #include <unistd.h>
 
 #include "base/limits.h"
-#include "platform/linux/descriptor.h"
-#include "platform/linux/service_message.h"
+#include "platform/linux/files/descriptor.h"
+#include "platform/linux/service/service_message.h"
 
 namespace {
 

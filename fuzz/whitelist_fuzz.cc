@@ -6,9 +6,9 @@
 #include "config/bh_config.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
-#include "tools/overlay_platform.h"
-#include "tools/whitelist_check.h"
-#include "tools/whitelist_model.h"
+#include "tools/overlay/overlay_platform.h"
+#include "tools/whitelist/whitelist_check.h"
+#include "tools/whitelist/whitelist_model.h"
 
 using namespace tavrel;
 

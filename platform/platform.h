@@ -2,6 +2,11 @@
 //
 // It is built once, by main, over the services of one platform. An operation that needs several
 // services takes `Platform&`; one that needs a single service takes that service.
+//
+// A variant of a platform is a copy in which some services are replaced:
+//
+//   Platform quiet = platform;
+//   quiet.log = silentLog;
 #pragma once
 
 #include "platform/application_registry.h"
@@ -13,7 +18,7 @@
 #include "platform/driver_registry.h"
 #include "platform/dynamic_loading.h"
 #include "platform/event_loop.h"
-#include "platform/files.h"
+#include "platform/file_reader.h"
 #include "platform/locale.h"
 #include "platform/named_service.h"
 #include "platform/notifications.h"
@@ -21,6 +26,7 @@
 #include "platform/process.h"
 #include "platform/process_state.h"
 #include "platform/property_list_coding.h"
+#include "platform/service_reference.h"
 #include "platform/stack_snapshot.h"
 #include "platform/standard_streams.h"
 #include "platform/statistics_store.h"
@@ -32,30 +38,30 @@
 namespace tavrel {
 
 struct Platform {
-  PWApplicationWorkspace& applications;
-  Clock& clock;
-  CrashReporting& crashReporting;
-  DateFormatting& dateFormatting;
-  DeviceAnswers& deviceAnswers;
-  Digest& digest;
-  DriverRegistry& drivers;
-  DynamicLoader& dynamicLoader;
-  EventLoop& eventLoop;
-  Files& files;
-  Locale& locale;
-  SystemLog& log;
-  NamedServices& namedServices;
-  Notifications& notifications;
-  Preferences& preferences;
-  Process& process;
-  PropertyListCoding& propertyLists;
-  StackSnapshots& stackSnapshots;
-  StandardStreams& standardStreams;
-  StatisticsStore& statistics;
-  SubmissionService& submission;
-  SystemControls& systemControls;
-  SystemVersion& systemVersion;
-  ProcessState& state;
+  ServiceReference<PWApplicationWorkspace> applications;
+  ServiceReference<Clock> clock;
+  ServiceReference<CrashReporting> crashReporting;
+  ServiceReference<DateFormatting> dateFormatting;
+  ServiceReference<DeviceAnswers> deviceAnswers;
+  ServiceReference<Digest> digest;
+  ServiceReference<DriverRegistry> drivers;
+  ServiceReference<DynamicLoader> dynamicLoader;
+  ServiceReference<EventLoop> eventLoop;
+  ServiceReference<FileReader> files;
+  ServiceReference<Locale> locale;
+  ServiceReference<SystemLog> log;
+  ServiceReference<NamedServices> namedServices;
+  ServiceReference<Notifications> notifications;
+  ServiceReference<Preferences> preferences;
+  ServiceReference<Process> process;
+  ServiceReference<PropertyListCoding> propertyLists;
+  ServiceReference<StackSnapshots> stackSnapshots;
+  ServiceReference<StandardStreams> standardStreams;
+  ServiceReference<StatisticsStore> statistics;
+  ServiceReference<SubmissionService> submission;
+  ServiceReference<SystemControls> systemControls;
+  ServiceReference<SystemVersion> systemVersion;
+  ServiceReference<ProcessState> state;
 };
 
 }  // namespace tavrel

@@ -7,13 +7,13 @@ namespace tavrel {
 BHReport::BHReport(Platform& platform) : platform_(platform), _config(BHConfig::init(platform)) {}
 
 void BHReport::writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo) {
-  platform_.log.log(LogLevel::Info, "writing tallied log. yesterday=%d", day);
+  platform_.log->log(LogLevel::Info, "writing tallied log. yesterday=%d", day);
   collect(day);
   serializeWithDate(day, withAppInfo);
 }
 
 void BHReport::collect(std::int32_t day) {
-  const auto history = platform_.statistics.initWithDefaultPath();
+  const auto history = platform_.statistics->initWithDefaultPath();
   const std::int64_t dayBefore = std::int64_t{day} - 1;
   history->scalarsForKeyPrefix(
       "", dayBefore, day, [this](std::string_view key, std::int32_t, std::int64_t value, bool&) {

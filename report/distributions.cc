@@ -57,10 +57,10 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
   std::optional<Histogram> histogram;
   const plist::Array intervals = withOptions.array(kIntervalsOption);
   if (intervals) {
-    platform_.log.log(LogLevel::Debug, "Treating key %@ as a histogram", forKey);
+    platform_.log->log(LogLevel::Debug, "Treating key %@ as a histogram", forKey);
     histogram = Histogram::create(intervals);
     if (!histogram) {
-      platform_.log.log(
+      platform_.log->log(
           LogLevel::Default,
           "Couldn't allocate histCounts for key %@. Will not calculate histogram values", forKey);
     }

@@ -16,25 +16,26 @@ void find(DynamicLibrary& library, std::string_view name, Function& function) {
 }  // namespace
 
 bool findFaultlinePreferences(Platform& platform) {
-  auto& getter = platform.state.integerPreferenceGetter;
-  auto& setter = platform.state.preferenceSetter;
+  auto& getter = platform.state->integerPreferenceGetter;
+  auto& setter = platform.state->preferenceSetter;
   if (getter && setter) return true;
 
-  const auto library = platform.dynamicLoader.load(kLibraryPath);
+  const auto library = platform.dynamicLoader->load(kLibraryPath);
   if (!library) {
-    platform.log.log(LogLevel::Error, "Failed to dynamically load the FaultlineSupport framework");
+    platform.log->log(LogLevel::Error, "Failed to dynamically load the FaultlineSupport framework");
     return false;
   }
   if (!getter) {
     find(*library, "ZTXPreferencesGetIntegerValue", getter);
     if (!getter) {
-      platform.log.log(LogLevel::Error, "Failed to dyanmically link ZTXPreferencesGetIntegerValue");
+      platform.log->log(LogLevel::Error,
+                        "Failed to dyanmically link ZTXPreferencesGetIntegerValue");
     }
   }
   if (!setter) {
     find(*library, "ZTXPreferencesSetValue", setter);
     if (!setter) {
-      platform.log.log(LogLevel::Error, "Failed to dynamically link ZTXPreferencesSetValue");
+      platform.log->log(LogLevel::Error, "Failed to dynamically link ZTXPreferencesSetValue");
     }
   }
   return getter && setter;

@@ -63,10 +63,12 @@ void BHReport::addInstalledAppInfo() {
 
   std::int64_t all = 0;
   std::int64_t user = 0;
-  platform_.applications.enumerateBundles(kInstalledApplications, [&](const PWBundleProxy& bundle) {
-    ++all;
-    if (bundle.bundleType() == PWUserApplicationType) ++user;
-  });
+  platform_.applications->enumerateBundles(kInstalledApplications,
+                                           [&](const PWBundleProxy& bundle) {
+                                             ++all;
+                                             if (bundle.bundleType() == PWUserApplicationType)
+                                               ++user;
+                                           });
   if (allOptions) addScalar(all, kAllAppsKey, allOptions);
   if (userOptions) addScalar(user, kUserAppsKey, userOptions);
 }
@@ -85,7 +87,7 @@ void BHReport::addMetadataKeys() {
 void BHReport::reportDatabaseSize() {
   addScalarForKey(kDatabaseSizeKey, [this]() -> std::int64_t {
     const std::string path = format("%s/Library/Brimhold/BHDataStore.sqlitedb", kHomeDirectory);
-    const auto bytes = platform_.files.size(path);
+    const auto bytes = platform_.files->size(path);
     return bytes ? *bytes / kBytesPerMiB : -1;
   });
   addScalarForKey(kCorruptionsKey, [this] { return takeCorruptionCount(); });
@@ -104,10 +106,10 @@ std::int64_t BHReport::takeCorruptionCount() {
 
 void BHReport::reportCPUUptime() {
   addScalarForKey(kUptimeKey, [this]() -> std::int64_t {
-    const std::uint64_t ticks = platform_.clock.ticks();
-    const auto base = platform_.clock.timeBase();
+    const std::uint64_t ticks = platform_.clock->ticks();
+    const auto base = platform_.clock->timeBase();
     if (!base || base->denominator == 0) {
-      platform_.log.log(LogLevel::Error, "Couldn't retrieve mach_timebase_info");
+      platform_.log->log(LogLevel::Error, "Couldn't retrieve mach_timebase_info");
       return -1;
     }
     const double minutesPerTick = base->numerator * 1e-9 / base->denominator / 60;

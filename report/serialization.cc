@@ -38,17 +38,17 @@ void BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInf
   _config.reset();
 
   const auto encoded =
-      platform_.propertyLists.encodeXml(logDictionary(day, andAppInfo, whitelistDigest));
+      platform_.propertyLists->encodeXml(logDictionary(day, andAppInfo, whitelistDigest));
   if (!encoded) {
-    platform_.log.log(LogLevel::Error, "Could not create tallied plist: %@",
-                      encoded.error().message);
+    platform_.log->log(LogLevel::Error, "Could not create tallied plist: %@",
+                       encoded.error().message);
     return;
   }
 
-  const bool submitted = platform_.submission.ZTXWriteLogForSubmission(
+  const bool submitted = platform_.submission->ZTXWriteLogForSubmission(
       kTalliedLogType, kTalliedLogName, submissionOptions(),
       [&](LogFile& file) { file.write(asBytes(*encoded)); });
-  if (!submitted) platform_.log.log(LogLevel::Error, "Failed to write tallied log");
+  if (!submitted) platform_.log->log(LogLevel::Error, "Failed to write tallied log");
 }
 
 plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& appInfo,
@@ -60,8 +60,8 @@ plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& 
 
   plist::Dictionary log{
       {"BHCrashLogVersion", kLogVersion},
-      {"BHStartDate", platform_.statistics.dateForDaysSince1970(day)},
-      {"BHLogCreationDate", platform_.clock.now()},
+      {"BHStartDate", platform_.statistics->dateForDaysSince1970(day)},
+      {"BHLogCreationDate", platform_.clock->now()},
       {"BHMetadata", _metadataOutput},
       {"BHScalars", _scalarsOutput},
       {"BHDistributions", _distributionsOutput},
@@ -86,7 +86,7 @@ plist::Dictionary BHReport::submissionOptions() {
 void BHReport::noteOSVersion(plist::Dictionary& options) {
   Preferences& preferences = platform_.preferences;
   const plist::Value stored = preferences.ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain);
-  const plist::Value current = platform_.submission.ZTXOSVersion();
+  const plist::Value current = platform_.submission->ZTXOSVersion();
   if (current == stored) return;
   preferences.ZTXPreferencesSetValue(kLastOSVersionKey, current, kTavrelDomain);
   preferences.ZTXPreferencesSynchronize(kTavrelDomain);
@@ -94,8 +94,8 @@ void BHReport::noteOSVersion(plist::Dictionary& options) {
 }
 
 void BHReport::addConfigNumber(plist::Dictionary& options) {
-  if (!platform_.submission.hasInternalDiagnostics(kInternalDiagnosticsIdentifier)) return;
-  const auto answer = platform_.deviceAnswers.SQCopyAnswer("ConfigNumber").data();
+  if (!platform_.submission->hasInternalDiagnostics(kInternalDiagnosticsIdentifier)) return;
+  const auto answer = platform_.deviceAnswers->SQCopyAnswer("ConfigNumber").data();
   if (!answer) return;
   if (const auto text = terminatedText(answer.bytes())) options.set("ConfigNumber", *text);
 }

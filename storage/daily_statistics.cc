@@ -24,7 +24,7 @@ std::int64_t mebibytes(const std::optional<plist::Number>& bytes) {
 }
 
 void reportDiskUsage(Platform& platform) {
-  const plist::Dictionary usage = platform.deviceAnswers.SQCopyAnswer("DiskUsage").dictionary();
+  const plist::Dictionary usage = platform.deviceAnswers->SQCopyAnswer("DiskUsage").dictionary();
   const std::int64_t capacity = mebibytes(usage.number(kSQQDiskUsageTotalDiskCapacity));
   const std::int64_t available = mebibytes(usage.number(kSQQDiskUsageTotalDataAvailable));
   StatisticsStore& store = platform.statistics;
@@ -36,17 +36,17 @@ void reportNANDInfoScalars(Platform& platform) {
   DumpStorageStructuredLog(platform, false);
   const plist::Dictionary info = CopyNANDInfo(platform);
   if (!info) {
-    platform.log.log(LogLevel::Default, "failed to get NAND info dict");
+    platform.log->log(LogLevel::Default, "failed to get NAND info dict");
     return;
   }
   if (info.contains(kNANDInfoErrorKey)) {
-    platform.log.log(LogLevel::Default, "error reading nand info, error %@ with message %@",
-                     info.get(kNANDInfoErrorKey), info.get(kNANDInfoErrorMessageKey));
+    platform.log->log(LogLevel::Default, "error reading nand info, error %@ with message %@",
+                      info.get(kNANDInfoErrorKey), info.get(kNANDInfoErrorMessageKey));
     return;
   }
   for (const auto& [key, value] : info) {
     if (const auto number = value.number()) {
-      platform.statistics.BHClientSetValueForScalarKey(key, number->int64());
+      platform.statistics->BHClientSetValueForScalarKey(key, number->int64());
     }
   }
 }
@@ -80,17 +80,17 @@ plist::Dictionary dictionaryOf(const ECCEventRecord& event) {
 void reportECCEvents(Platform& platform) {
   ECCEventRecord event{};
   const auto readNext = [&] {
-    return platform.systemControls.read("kern.next_ecc_event", event).errorNumber;
+    return platform.systemControls->read("kern.next_ecc_event", event).errorNumber;
   };
   int error = readNext();
   for (int logged = 0; error == 0 && logged < kMostEventsLogged; ++logged) {
-    platform.crashReporting.FLLogStructuredData(kEccRecordType, dictionaryOf(event));
+    platform.crashReporting->FLLogStructuredData(kEccRecordType, dictionaryOf(event));
     error = readNext();
   }
   // Also said, with 0, when events were left over: the last one read is not logged.
   if (error != kNoSuchEntry && error != kBusy) {
-    platform.log.log(LogLevel::Default, "Unexpected errno (%d) reading ECC events from kernel",
-                     error);
+    platform.log->log(LogLevel::Default, "Unexpected errno (%d) reading ECC events from kernel",
+                      error);
   }
 }
 
@@ -118,7 +118,7 @@ void reportChannels(Platform& platform) {
   if (!samples) return;
   IOReportIterate(samples, [&platform](const plist::Dictionary& channel) {
     if (isSimple(channel)) {
-      platform.statistics.BHClientSetValueForScalarKey(
+      platform.statistics->BHClientSetValueForScalarKey(
           format("com.norvane.ioreport.%@", textOrNull(IOReportChannelGetChannelName(channel))),
           IOReportSimpleGetIntegerValue(channel));
     }
@@ -128,10 +128,14 @@ void reportChannels(Platform& platform) {
 
 }  // namespace
 
-void dailyStorageStatistics(Platform& platform) {
+void dailyStorageStatistics(Platform& platform, const StepObserver& onStep) {
+  beginStep(onStep, "Disk space");
   reportDiskUsage(platform);
+  beginStep(onStep, "Structured storage log and NAND information");
   reportNANDInfoScalars(platform);
+  beginStep(onStep, "ECC events");
   reportECCEvents(platform);
+  beginStep(onStep, "Report channels");
   reportChannels(platform);
 }
 

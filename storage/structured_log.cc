@@ -78,7 +78,7 @@ void measureWriteAmplification(Platform& platform) {
   gCurrentUserWamp = gCurrentSysWamp = 0;
   const std::unique_ptr<ASPContext> context(new (std::nothrow) ASPContext());
   if (!context) {
-    platform.standardStreams.writeError("not enough memory?");
+    platform.standardStreams->writeError("not enough memory?");
     gNeedValidityList = gForceCollectionSet;
     return;
   }
@@ -191,7 +191,7 @@ bool DumpStorageStructuredLog(Platform& platform, bool requestFlag) {
   const NandExporter* exporter = nullptr;
   const auto service = findNandExporter(platform.drivers, exporter);
   if (!service) {
-    platform.standardStreams.writeError(
+    platform.standardStreams->writeError(
         "Could not get matching Kernkit service for exporting classes\n");
     return false;
   }

@@ -118,15 +118,15 @@ std::vector<Column> columnsOf(std::uint32_t generation) {
 bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics) {
   const std::unique_ptr<TelemetryCounters> counters(new (std::nothrow) TelemetryCounters());
   if (!counters) {
-    platform.standardStreams.printError("ERROR: Could not malloc %zu bytes\n",
-                                        sizeof(TelemetryCounters));
+    platform.standardStreams->printError("ERROR: Could not malloc %zu bytes\n",
+                                         sizeof(TelemetryCounters));
     return false;
   }
   const auto controller = controllerOf(characteristics, platform.standardStreams);
   if (!controller) return false;
   const std::int64_t channels = controller->channels;
   if (channels * (kBlockBytes + kChannelRecordBytes) > static_cast<std::int64_t>(buffer.size())) {
-    platform.standardStreams.writeError(
+    platform.standardStreams->writeError(
         "ERROR: Attempting to parse beyond the bounds of the buffer\n");
     return false;
   }
@@ -147,7 +147,7 @@ bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& c
     }
     for (const Column& column : columns)
       record.set(column.key, static_cast<std::int32_t>(counters->elements[column.element]));
-    platform.crashReporting.FLLogStructuredData(kStorageRecordType, record);
+    platform.crashReporting->FLLogStructuredData(kStorageRecordType, record);
   }
   return true;
 }

@@ -32,7 +32,7 @@ bool logValidityList(Platform& platform, ByteSpan buffer, const plist::Value&) {
   const std::uint64_t items = loadLittle32(buffer, kItemCount).value_or(0);
   const std::uint64_t first = kHeaderBytes + items * kItemBytes;
   if (count == 0 || buffer.size() < first + count * kRecordBytes) {
-    platform.standardStreams.writeError("data cannot be parsed");
+    platform.standardStreams->writeError("data cannot be parsed");
     return false;
   }
 

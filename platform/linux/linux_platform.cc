@@ -2,29 +2,30 @@
 
 #include <utility>
 
-#include "platform/linux/digests.h"
-#include "platform/linux/file_crash_reporting.h"
-#include "platform/linux/file_device_answers.h"
-#include "platform/linux/file_layer.h"
-#include "platform/linux/file_notifications.h"
-#include "platform/linux/file_preferences.h"
-#include "platform/linux/file_submission.h"
-#include "platform/linux/linux_applications.h"
-#include "platform/linux/linux_clock.h"
-#include "platform/linux/linux_date_formatting.h"
-#include "platform/linux/linux_dynamic_loader.h"
-#include "platform/linux/linux_event_loop.h"
-#include "platform/linux/linux_files.h"
-#include "platform/linux/linux_locale.h"
-#include "platform/linux/linux_process.h"
-#include "platform/linux/linux_standard_streams.h"
-#include "platform/linux/linux_system_controls.h"
-#include "platform/linux/linux_system_log.h"
-#include "platform/linux/linux_system_version.h"
-#include "platform/linux/recorded_registry.h"
-#include "platform/linux/recorded_snapshots.h"
-#include "platform/linux/socket_service.h"
-#include "platform/linux/sqlite_store.h"
+#include "base/limits.h"
+#include "platform/linux/device/file_device_answers.h"
+#include "platform/linux/device/linux_applications.h"
+#include "platform/linux/device/linux_dynamic_loader.h"
+#include "platform/linux/device/linux_system_controls.h"
+#include "platform/linux/device/linux_system_version.h"
+#include "platform/linux/files/device_file_reader.h"
+#include "platform/linux/files/digests.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/locale/linux_date_formatting.h"
+#include "platform/linux/locale/linux_locale.h"
+#include "platform/linux/logs/file_crash_reporting.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/process/linux_clock.h"
+#include "platform/linux/process/linux_event_loop.h"
+#include "platform/linux/process/linux_process.h"
+#include "platform/linux/process/linux_standard_streams.h"
+#include "platform/linux/recorded/recorded_registry.h"
+#include "platform/linux/recorded/recorded_snapshots.h"
+#include "platform/linux/service/file_notifications.h"
+#include "platform/linux/service/socket_service.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/linux/system_log/linux_system_log.h"
 #include "platform/plist/coding.h"
 
 namespace tavrel {
@@ -32,33 +33,43 @@ namespace tavrel {
 // Members are destroyed from the last to the first: the store commits while preferences can still
 // be set, preferences are written while the log can still tell a failure.
 struct LinuxPlatform::Services {
-  explicit Services(DeviceRoot folder) : root(std::move(folder)) {}
+  Services(DeviceRoot folder, const LinuxPlatformOptions& given)
+      : options(given), root(std::move(folder)) {}
 
+  const LinuxPlatformOptions options;
   const DeviceRoot root;
-  LinuxSystemLog log;
+  LinuxSystemLog systemLog;
+  SystemLog& log = options.log != nullptr ? *options.log : systemLog;
   LinuxClock clock;
-  FileLayer layer;
+  FileSystem ownFileSystem;
+  FileSystem& fileSystem = options.fileSystem != nullptr ? *options.fileSystem : ownFileSystem;
   plist::PlistCoding propertyLists;
-  LinuxFiles files{root, layer};
+  DeviceFileReader files{root, fileSystem};
   LinuxDigest digest;
-  LinuxSystemVersion systemVersion{root, layer, propertyLists, log};
-  FileDeviceAnswers answers{root, layer, propertyLists, log};
-  FilePreferences preferences{root, layer, propertyLists, clock, log};
-  SqliteStore store{root, clock, preferences, log};
-  FileSubmission submission{root, layer, propertyLists, preferences, systemVersion, clock, log};
-  FileCrashReporting crashReporting{root, layer, systemVersion, clock, log};
+  LinuxSystemVersion systemVersion{root, fileSystem, propertyLists, log};
+  FileDeviceAnswers answers{root, fileSystem, propertyLists, log};
+  FilePreferences filePreferences{root, fileSystem, propertyLists, clock, log};
+  Preferences& preferences =
+      options.preferences != nullptr ? *options.preferences : filePreferences;
+  SqliteStore store{
+      root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
+  FileSubmission submission{root,  fileSystem, propertyLists, preferences, systemVersion,
+                            clock, log};
+  FileCrashReporting crashReporting{root, fileSystem, systemVersion, clock, log};
   LinuxApplications applications{root, log};
   LinuxLocale locale{root, log};
-  LinuxSystemControls systemControls{root, layer, propertyLists, log};
-  LinuxDynamicLoader dynamicLoader{root, layer, propertyLists, log, preferences};
+  LinuxSystemControls systemControls{
+      root, fileSystem, propertyLists, log,
+      options.readOnly ? EccEvents::Mode::Peek : EccEvents::Mode::Consume};
+  LinuxDynamicLoader dynamicLoader{root, fileSystem, propertyLists, log, preferences};
   FileNotifications notifications{root, log};
   LinuxEventLoop eventLoop;
   SocketServices namedServices{eventLoop, root, log};
   LinuxDateFormatting dateFormatting{root};
   LinuxProcess process;
   LinuxStandardStreams standardStreams;
-  RecordedRegistry drivers{root, layer, propertyLists, log};
-  RecordedSnapshots stackSnapshots{root, layer, log};
+  RecordedRegistry drivers{root, fileSystem, propertyLists, log};
+  RecordedSnapshots stackSnapshots{root, fileSystem, log};
   ProcessState state;
 
   Platform platform{
@@ -89,8 +100,8 @@ struct LinuxPlatform::Services {
   };
 };
 
-LinuxPlatform::LinuxPlatform(DeviceRoot root)
-    : services_(std::make_unique<Services>(std::move(root))) {}
+LinuxPlatform::LinuxPlatform(DeviceRoot root, const LinuxPlatformOptions& options)
+    : services_(std::make_unique<Services>(std::move(root), options)) {}
 LinuxPlatform::~LinuxPlatform() = default;
 
 Platform& LinuxPlatform::platform() {
@@ -99,14 +110,20 @@ Platform& LinuxPlatform::platform() {
 const DeviceRoot& LinuxPlatform::root() const {
   return services_->root;
 }
-FileLayer& LinuxPlatform::fileLayer() {
-  return services_->layer;
+FileCrashReporting& LinuxPlatform::crashReporting() {
+  return services_->crashReporting;
+}
+FileSystem& LinuxPlatform::fileSystem() {
+  return services_->fileSystem;
 }
 FilePreferences& LinuxPlatform::preferences() {
-  return services_->preferences;
+  return services_->filePreferences;
 }
 FileSubmission& LinuxPlatform::submission() {
   return services_->submission;
+}
+RecordedRegistry& LinuxPlatform::registry() {
+  return services_->drivers;
 }
 SqliteStore& LinuxPlatform::store() {
   return services_->store;

@@ -3,25 +3,37 @@
 //   LinuxPlatform linux(DeviceRoot::fromEnvironment());
 //   runDailyIfNeeded(linux.platform(), {});
 //
+// Variants of a platform copy the bundle and replace what they do differently in the copy.
+//
 // It owns the services. Nothing is opened or read before it is asked for. On destruction the values
 // that the store holds back are committed, then preferences that were changed are written.
 #pragma once
 
 #include <memory>
 
-#include "platform/linux/device_root.h"
+#include "platform/linux/files/device_root.h"
 #include "platform/platform.h"
 
 namespace tavrel {
 
-class FileLayer;
+class FileCrashReporting;
 class FilePreferences;
 class FileSubmission;
+class FileSystem;
+class RecordedRegistry;
 class SqliteStore;
+
+/// What one Linux platform may differ in from another. What is given here must outlive it.
+struct LinuxPlatformOptions {
+  SystemLog* log = nullptr;            // in place of the journal or standard error
+  FileSystem* fileSystem = nullptr;    // what writes files, in place of its own
+  Preferences* preferences = nullptr;  // what the other services read, in place of its own
+  bool readOnly = false;  // a damaged store stays where it is, ECC events stay in their queue
+};
 
 class LinuxPlatform {
  public:
-  explicit LinuxPlatform(DeviceRoot root);
+  explicit LinuxPlatform(DeviceRoot root, const LinuxPlatformOptions& options = {});
   ~LinuxPlatform();
   LinuxPlatform(const LinuxPlatform&) = delete;
   LinuxPlatform& operator=(const LinuxPlatform&) = delete;
@@ -30,9 +42,11 @@ class LinuxPlatform {
   const DeviceRoot& root() const;
 
   /// The concrete services, for operations that only the tool has.
-  FileLayer& fileLayer();
+  FileCrashReporting& crashReporting();
+  FileSystem& fileSystem();
   FilePreferences& preferences();
   FileSubmission& submission();
+  RecordedRegistry& registry();
   SqliteStore& store();
 
  private:

@@ -52,10 +52,10 @@ std::string bodyOf(const plist::Dictionary& statistics) {
 }
 
 std::string logText(Platform& platform, plist::Date now, const plist::Dictionary& statistics) {
-  const std::string date = platform.dateFormatting.format(now, kDatePattern, kDateLocale);
+  const std::string date = platform.dateFormatting->format(now, kDatePattern, kDateLocale);
   const std::string body = bodyOf(statistics);
-  const std::string line =
-      format("%@ %@[%d]: %@\n", date, platform.process.name(), platform.process.identifier(), body);
+  const std::string line = format("%@ %@[%d]: %@\n", date, platform.process->name(),
+                                  platform.process->identifier(), body);
   CrashReporting& support = platform.crashReporting;
   const std::string system = support.systemIdentifier();
   const std::string hardware = support.hardwareModel();
@@ -68,23 +68,24 @@ std::string logText(Platform& platform, plist::Date now, const plist::Dictionary
 }
 
 void writeLog(Platform& platform, std::string_view logType, const plist::Dictionary& statistics) {
-  const plist::Date now = platform.clock.now();
+  const plist::Date now = platform.clock->now();
   const auto last =
-      platform.preferences.ZTXPreferencesGetValue(kNandLogLastLoggedKey, kDefaultPreferenceDomain)
+      platform.preferences->ZTXPreferencesGetValue(kNandLogLastLoggedKey, kDefaultPreferenceDomain)
           .date();
   if (last && now - *last < kNandLogPeriod) {
-    platform.log.log(LogLevel::Default, "NANDLogWriter:Last written at %@ current %@ :skipped",
-                     *last, now);
+    platform.log->log(LogLevel::Default, "NANDLogWriter:Last written at %@ current %@ :skipped",
+                      *last, now);
     return;
   }
   if (!statistics) return;
 
   const std::string text = repairedUtf8(logText(platform, now, statistics));
   // The next attempt waits a whole period in any case: a service that fails is not pressed.
-  platform.submission.ZTXWriteLogForSubmission(
+  platform.submission->ZTXWriteLogForSubmission(
       logType, kNandLogName, {}, [&text](LogFile& file) { file.write(asBytes(text)); });
-  platform.preferences.ZTXPreferencesSetValue(kNandLogLastLoggedKey, now, kDefaultPreferenceDomain);
-  platform.preferences.ZTXPreferencesSynchronize(kDefaultPreferenceDomain);
+  platform.preferences->ZTXPreferencesSetValue(kNandLogLastLoggedKey, now,
+                                               kDefaultPreferenceDomain);
+  platform.preferences->ZTXPreferencesSynchronize(kDefaultPreferenceDomain);
 }
 
 }  // namespace
@@ -94,7 +95,7 @@ void NLW_WriteLog(Platform& platform, std::string_view logType,
   try {
     writeLog(platform, logType, statistics);
   } catch (const PlatformException& exception) {
-    platform.log.log(LogLevel::Error, "An exception occurred: %@", exception.name());
+    platform.log->log(LogLevel::Error, "An exception occurred: %@", exception.name());
   }
 }
 

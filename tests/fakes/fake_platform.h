@@ -175,7 +175,7 @@ struct FakeDigest : Digest {
   }
 };
 
-struct FakeFiles : Files {
+struct FakeFileReader : FileReader {
   std::map<std::string, std::string, std::less<>> contents;
 
   Expected<std::string> read(std::string_view path, std::size_t largest) override {
@@ -333,7 +333,7 @@ struct FakePlatform {
   FakePreferences preferences{journal};
   FakeLoader loader{preferences};
   FakeEventLoop eventLoop;
-  FakeFiles files;
+  FakeFileReader files;
   FakeLocale locale;
   FakeLog log;
   FakeServices services;

@@ -7,7 +7,7 @@
 
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
-#include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded/recorded_registry.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel::reporting {

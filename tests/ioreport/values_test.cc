@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
-#include "platform/linux/linux_descriptor_writer.h"
+#include "platform/linux/process/linux_descriptor_writer.h"
 #include "reporting.h"
 
 namespace tavrel {

@@ -2,7 +2,7 @@
 
 #include "base/limits.h"
 #include "platform/application_registry.h"
-#include "platform/linux/linux_applications.h"
+#include "platform/linux/device/linux_applications.h"
 #include "temporary_root.h"
 
 namespace tavrel {

@@ -1,10 +1,10 @@
 #include <cerrno>
 
 #include "base/text.h"
-#include "platform/linux/file_preferences.h"
-#include "platform/linux/linux_clock.h"
-#include "platform/linux/linux_dynamic_loader.h"
-#include "platform/linux/linux_system_controls.h"
+#include "platform/linux/device/linux_dynamic_loader.h"
+#include "platform/linux/device/linux_system_controls.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/process/linux_clock.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -26,7 +26,7 @@ class ControlsTest : public testing::Test {
 
   TemporaryRoot device;
   KeptLog log;
-  FileLayer files;
+  FileSystem files;
   plist::PlistCoding coding;
 };
 

@@ -1,7 +1,7 @@
 #include <cmath>
 #include <gtest/gtest.h>
 
-#include "platform/linux/linux_date_formatting.h"
+#include "platform/linux/locale/linux_date_formatting.h"
 #include "temporary_root.h"
 
 namespace tavrel {

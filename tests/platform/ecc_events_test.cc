@@ -1,11 +1,11 @@
 // The queue of ECC events, and the errors that the kernel counts.
-#include "platform/linux/ecc_events.h"
+#include "platform/linux/device/ecc_events.h"
 
 #include <cerrno>
 #include <gtest/gtest.h>
 
 #include "base/text.h"
-#include "platform/linux/linux_system_controls.h"
+#include "platform/linux/device/linux_system_controls.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -17,7 +17,7 @@ constexpr const char* kController = "/sys/devices/system/edac/mc/mc0/";
 
 struct EccDevice : TemporaryRoot {
   KeptLog log;
-  FileLayer files;
+  FileSystem files;
   plist::PlistCoding coding;
 
   EccDevice() {
@@ -112,7 +112,7 @@ TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
   auto peek = device.events(EccEvents::Mode::Peek);
   EXPECT_EQ(all(peek), "8:; 1: 0 5 5; 2: 0 1 1; 9:; ");
   EXPECT_EQ(device.queue().size(), 2U);
-  EXPECT_FALSE(FileLayer::status(device.root.path("/var/lib/tavrel/edac-counters.plist")));
+  EXPECT_FALSE(FileSystem::status(device.root.path("/var/lib/tavrel/edac-counters.plist")));
 
   auto first = device.events();
   EXPECT_EQ(all(first), "8:; 1: 0 5 5; 2: 0 1 1; 9:; ");

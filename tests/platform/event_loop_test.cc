@@ -5,7 +5,7 @@
 #include <string>
 #include <unistd.h>
 
-#include "platform/linux/linux_event_loop.h"
+#include "platform/linux/process/linux_event_loop.h"
 
 namespace tavrel {
 namespace {

@@ -3,9 +3,9 @@
 #include <sys/stat.h>
 
 #include "base/limits.h"
-#include "platform/linux/language_matching.h"
-#include "platform/linux/language_tag.h"
-#include "platform/linux/linux_locale.h"
+#include "platform/linux/locale/language_matching.h"
+#include "platform/linux/locale/language_tag.h"
+#include "platform/linux/locale/linux_locale.h"
 #include "temporary_root.h"
 
 namespace tavrel {

@@ -3,10 +3,10 @@
 
 #include "base/limits.h"
 #include "base/text.h"
-#include "faulty_file_layer.h"
-#include "platform/linux/file_preferences.h"
-#include "platform/linux/json_line.h"
-#include "platform/linux/linux_clock.h"
+#include "faulty_file_system.h"
+#include "platform/linux/logs/json_line.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/process/linux_clock.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -20,8 +20,9 @@ constexpr std::string_view kFile = "/var/mobile/Library/Preferences/com.example.
 
 /// One process's view of a device's preferences.
 struct Process {
-  Process(const DeviceRoot& root, FileLayer& layer)
-      : preferences(std::make_unique<FilePreferences>(root, layer, propertyLists, clock, log)) {}
+  Process(const DeviceRoot& root, FileSystem& fileSystem)
+      : preferences(
+            std::make_unique<FilePreferences>(root, fileSystem, propertyLists, clock, log)) {}
   explicit Process(const DeviceRoot& root) : Process(root, ownFiles) {}
 
   std::string get(std::string_view key) {
@@ -37,7 +38,7 @@ struct Process {
     return text;
   }
 
-  QuickFileLayer ownFiles;
+  QuickFileSystem ownFiles;
   plist::PlistCoding propertyLists;
   LinuxClock clock;
   KeptLog log;
@@ -120,7 +121,7 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
       const std::string name = entry.path().filename();
       if (name.starts_with("com.example.domain.plist.corrupt-")) aside = entry.path();
     }
-    EXPECT_EQ(*FileLayer().read(aside, 100), content);
+    EXPECT_EQ(*FileSystem().read(aside, 100), content);
     EXPECT_EQ(process.preferences->domains()->size(), 1U);
   }
 }
@@ -192,7 +193,7 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
     return done;
   };
   for (const bool corrupt : {false, true}) {
-    for (const auto fault : FaultyFileLayer::kFaults) {
+    for (const auto fault : FaultyFileSystem::kFaults) {
       int call = 1;
       for (bool struck = true; struck; ++call) {
         SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call
@@ -205,7 +206,7 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
           before.set("a", "old");
           before.set("kept", 1);
         }
-        FaultyFileLayer faulty(device.root.path("/"), fault, call);
+        FaultyFileSystem faulty(device.root.path("/"), fault, call);
         {
           Process process(device.root, faulty);
           int done = makeSteps(process);

@@ -4,8 +4,8 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/text.h"
-#include "platform/linux/recorded_registry.h"
-#include "platform/linux/recorded_snapshots.h"
+#include "platform/linux/recorded/recorded_registry.h"
+#include "platform/linux/recorded/recorded_snapshots.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -458,7 +458,7 @@ class RecordingFolderTest : public testing::Test {
 
   TemporaryRoot device;
   KeptLog log;
-  FileLayer files;
+  FileSystem files;
   plist::PlistCoding coding;
   RecordedRegistry registry{device.root, files, coding, log};
 };

@@ -6,11 +6,11 @@
 #include <sys/stat.h>
 
 #include "base/limits.h"
-#include "platform/linux/file_notifications.h"
-#include "platform/linux/service_client.h"
-#include "platform/linux/service_message.h"
-#include "platform/linux/service_socket.h"
-#include "platform/linux/socket_service.h"
+#include "platform/linux/service/file_notifications.h"
+#include "platform/linux/service/service_client.h"
+#include "platform/linux/service/service_message.h"
+#include "platform/linux/service/service_socket.h"
+#include "platform/linux/service/socket_service.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
 #include "temporary_root.h"

@@ -9,14 +9,14 @@
 
 #include "base/text.h"
 #include "fixed_clock.h"
-#include "platform/linux/digests.h"
-#include "platform/linux/file_crash_reporting.h"
-#include "platform/linux/file_device_answers.h"
-#include "platform/linux/json_line.h"
+#include "platform/linux/device/file_device_answers.h"
+#include "platform/linux/device/linux_system_version.h"
+#include "platform/linux/files/digests.h"
+#include "platform/linux/files/stamp.h"
 #include "platform/linux/linux_platform.h"
-#include "platform/linux/linux_system_log.h"
-#include "platform/linux/linux_system_version.h"
-#include "platform/linux/stamp.h"
+#include "platform/linux/logs/file_crash_reporting.h"
+#include "platform/linux/logs/json_line.h"
+#include "platform/linux/system_log/linux_system_log.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -27,14 +27,14 @@ namespace fs = std::filesystem;
 
 struct Services : TemporaryRoot {
   KeptLog log;
-  FileLayer files;
+  FileSystem files;
   FixedClock clock;
   plist::PlistCoding propertyLists;
   LinuxSystemVersion version{root, files, propertyLists, log};
   FileDeviceAnswers answers{root, files, propertyLists, log};
 
   std::string read(std::string_view path) const {
-    return *FileLayer().read(root.path(path), 1U << 20);
+    return *FileSystem().read(root.path(path), 1U << 20);
   }
 };
 
@@ -202,7 +202,7 @@ TEST(SystemLog, SpeaksToTheJournalWhenTheStreamIsItsOwn) {
   // An entry beyond a datagram arrives as a file, without bytes of its own.
   log.write(LogLevel::Info, std::string(16U << 20, 'x'));
   EXPECT_EQ(received(MSG_DONTWAIT), "");
-  EXPECT_EQ(*FileLayer().read(device.root.path("/stream"), 100), "<3>one\n<3>two\n");
+  EXPECT_EQ(*FileSystem().read(device.root.path("/stream"), 100), "<3>one\n<3>two\n");
 }
 
 TEST(SmallServices, AnswerWhatTheyAreFor) {
@@ -219,19 +219,19 @@ TEST(SmallServices, AnswerWhatTheyAreFor) {
 
 TEST(Platform, WritesNothingUnlessAskedAndEverythingAtTheEnd) {
   const TemporaryRoot device;
-  EXPECT_FALSE(LinuxPlatform(device.root).platform().submission.isDiagnosticSubmissionEnabled());
+  EXPECT_FALSE(LinuxPlatform(device.root).platform().submission->isDiagnosticSubmissionEnabled());
   EXPECT_TRUE(fs::is_empty(device.root.path("/")));
   {
     LinuxPlatform linux(device.root);
-    linux.platform().preferences.ZTXPreferencesSetValue("k", 7, "com.example");
-    linux.platform().statistics.BHClientSetValueForScalarKey("com.example.key", 9);
+    linux.platform().preferences->ZTXPreferencesSetValue("k", 7, "com.example");
+    linux.platform().statistics->BHClientSetValueForScalarKey("com.example.key", 9);
   }
   LinuxPlatform later(device.root);
   Platform& platform = later.platform();
-  EXPECT_EQ(platform.preferences.ZTXPreferencesGetIntegerValue("k", "com.example"), 7);
+  EXPECT_EQ(platform.preferences->ZTXPreferencesGetIntegerValue("k", "com.example"), 7);
   std::int64_t found = 0;
-  platform.statistics.initWithDefaultPath()->scalarsForKeyPrefix(
-      "", 0, platform.statistics.BHDaysSince1970(),
+  platform.statistics->initWithDefaultPath()->scalarsForKeyPrefix(
+      "", 0, platform.statistics->BHDaysSince1970(),
       [&](std::string_view, std::int32_t, std::int64_t value, bool&) { found = value; });
   EXPECT_EQ(found, 9);
 }

@@ -10,11 +10,11 @@
 #include <sys/resource.h>
 #include <sys/stat.h>
 
-#include "faulty_file_layer.h"
+#include "faulty_file_system.h"
 #include "fixed_clock.h"
-#include "platform/linux/file_preferences.h"
-#include "platform/linux/sqlite_schema.h"
-#include "platform/linux/sqlite_store.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -113,7 +113,7 @@ class StoreTest : public testing::Test {
   TemporaryRoot root_;
   FixedClock clock_;
   KeptLog log_;
-  QuickFileLayer files_;
+  QuickFileSystem files_;
   plist::PlistCoding propertyLists_;
   FilePreferences preferences_{root_.root, files_, propertyLists_, clock_, log_};
   std::unique_ptr<SqliteStore> store_ = open();

@@ -2,11 +2,11 @@
 
 #include <set>
 
-#include "faulty_file_layer.h"
+#include "faulty_file_system.h"
 #include "fixed_clock.h"
-#include "platform/linux/file_preferences.h"
-#include "platform/linux/file_submission.h"
-#include "platform/linux/json_line.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/logs/json_line.h"
+#include "platform/linux/preferences/file_preferences.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
 
@@ -19,10 +19,10 @@ using Place = FileSubmission::Place;
 const std::string kContent(10'000, 'L');
 
 struct Service {
-  Service(const DeviceRoot& root, FileLayer& layer)
-      : version(root, layer, propertyLists, log),
-        preferences(root, layer, propertyLists, clock, log),
-        submission(root, layer, propertyLists, preferences, version, clock, log) {}
+  Service(const DeviceRoot& root, FileSystem& fileSystem)
+      : version(root, fileSystem, propertyLists, log),
+        preferences(root, fileSystem, propertyLists, clock, log),
+        submission(root, fileSystem, propertyLists, preferences, version, clock, log) {}
   explicit Service(const DeviceRoot& root) : Service(root, ownFiles) {}
 
   bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
@@ -32,7 +32,7 @@ struct Service {
     });
   }
 
-  QuickFileLayer ownFiles;
+  QuickFileSystem ownFiles;
   plist::PlistCoding propertyLists;
   FixedClock clock;
   KeptLog log;
@@ -77,12 +77,12 @@ TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
 }
 
 TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
-  for (const auto fault : FaultyFileLayer::kFaults) {
+  for (const auto fault : FaultyFileSystem::kFaults) {
     int call = 1;
     for (bool struck = true; struck; ++call) {
       SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
       const TemporaryRoot device;
-      FaultyFileLayer faulty(device.root.path("/"), fault, call);
+      FaultyFileSystem faulty(device.root.path("/"), fault, call);
       Service service(device.root, faulty);
       const bool filed = service.file();
       if (!filed) {

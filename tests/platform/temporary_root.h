@@ -14,7 +14,7 @@
 #include <unistd.h>
 #include <vector>
 
-#include "platform/linux/device_root.h"
+#include "platform/linux/files/device_root.h"
 #include "platform/system_log.h"
 
 namespace tavrel {

@@ -5,7 +5,7 @@
 #include <utility>
 #include <vector>
 
-#include "platform/linux/recorded_registry.h"
+#include "platform/linux/recorded/recorded_registry.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel::fakes {

@@ -10,13 +10,13 @@
 #include "config/persisted_state.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/entry.h"
-#include "platform/linux/descriptor.h"
-#include "platform/linux/file_notifications.h"
-#include "platform/linux/file_submission.h"
+#include "platform/linux/files/descriptor.h"
 #include "platform/linux/linux_platform.h"
-#include "platform/linux/service_client.h"
-#include "platform/linux/sqlite_batch.h"
-#include "platform/linux/sqlite_store.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/service/file_notifications.h"
+#include "platform/linux/service/service_client.h"
+#include "platform/linux/store/sqlite_batch.h"
+#include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/xml.h"
 #include "tests/fakes/plist_matching.h"
 #include "tests/platform/temporary_root.h"
@@ -61,13 +61,13 @@ struct Device {
     folder.write("/sys/devices/system/edac/mc/mc0/ce_count", "0\n");
     LinuxPlatform linuxPlatform(root);
     Platform& platform = linuxPlatform.platform();
-    platform.preferences.ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
-                                                "com.norvane.zentrix");
+    platform.preferences->ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
+                                                 "com.norvane.zentrix");
     const Dictionary setting{{"Domain", "com.example"}, {"Key", "k"}, {"Value", 7}};
-    platform.preferences.ZTXPreferencesSetValue(
+    platform.preferences->ZTXPreferencesSetValue(
         kScheduledTaskingKey, Dictionary{{"TaskingID", "t"}, {"TaskingPayload", Array{setting}}},
         kScheduleDomain);
-    yesterday = platform.statistics.BHDaysSince1970() - 1;
+    yesterday = platform.statistics->BHDaysSince1970() - 1;
     auto batch = linuxPlatform.store().beginBatch();
     static_cast<void>((*batch)->setScalar(yesterday, "k", 42));
     for (int i = 0; i < 3000; ++i)
@@ -120,7 +120,7 @@ struct Device {
   int storageScalars() const {
     LinuxPlatform linuxPlatform(root);
     int count = 0;
-    linuxPlatform.platform().statistics.initWithDefaultPath()->scalarsForKeyPrefix(
+    linuxPlatform.platform().statistics->initWithDefaultPath()->scalarsForKeyPrefix(
         "com.norvane.", yesterday, yesterday + 1,
         [&count](std::string_view, std::int32_t, std::int64_t, bool&) { ++count; });
     return count;
@@ -128,7 +128,7 @@ struct Device {
 
   plist::Value preference(std::string_view domain, std::string_view key) const {
     LinuxPlatform linuxPlatform(root);
-    return linuxPlatform.platform().preferences.ZTXPreferencesGetValue(key, domain);
+    return linuxPlatform.platform().preferences->ZTXPreferencesGetValue(key, domain);
   }
 
   /// Runs the built program and yields what it logged, without the times.
@@ -254,7 +254,7 @@ TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
   EXPECT_EQ(device.pendingLogs().size(), 8U);
   std::int64_t sum = 0;
   LinuxPlatform linuxPlatform(device.root);
-  linuxPlatform.platform().statistics.initWithDefaultPath()->scalarsForKeyPrefix(
+  linuxPlatform.platform().statistics->initWithDefaultPath()->scalarsForKeyPrefix(
       "sum", device.yesterday - 1, device.yesterday,
       [&sum](std::string_view, std::int32_t, std::int64_t value, bool&) { sum = value; });
   EXPECT_EQ(sum, 8);

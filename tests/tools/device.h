@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "platform/plist/xml.h"
-#include "tools/json_value.h"
+#include "tools/shared/json_value.h"
 #include "tools/tavrelctl.h"
 
 namespace tavrel {

@@ -2,8 +2,8 @@
 #include <csignal>
 
 #include "device.h"
-#include "tools/import_lines.h"
-#include "tools/import_number.h"
+#include "tools/stat/import_lines.h"
+#include "tools/stat/import_number.h"
 
 namespace tavrel {
 namespace {

@@ -3,7 +3,7 @@
 
 #include "base/format.h"
 #include "device.h"
-#include "tools/base64.h"
+#include "tools/shared/base64.h"
 
 namespace tavrel {
 namespace {

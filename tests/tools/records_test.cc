@@ -4,7 +4,7 @@
 
 #include "base/format.h"
 #include "device.h"
-#include "tools/record_reader.h"
+#include "tools/records/record_reader.h"
 
 namespace tavrel {
 namespace {

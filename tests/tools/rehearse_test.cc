@@ -70,8 +70,10 @@ struct Rehearsed : TemporaryDevice {
 constexpr const char* kToday =
     R"text(Rehearsal of the forced run for day TODAY (DATE). Nothing is changed.
 
-Checkpoint of the statistics store
+Daily tasks
   logs default: daily tasks for day TODAY
+
+Checkpoint of the statistics store
   would checkpoint the statistics store
 
 Report
@@ -168,7 +170,7 @@ TEST(Rehearse, TellsEveryStepAndChangesNothing) {
   EXPECT_EQ(document["run"], "forced");
   EXPECT_EQ(document["totals"], nlohmann::json::parse(R"({"set_preference": 2, "set_scalar": 17,
                                                          "file_record": 4, "submit_log": 1})"));
-  EXPECT_EQ(document["steps"][2]["events"][0], nlohmann::json::parse(R"({
+  EXPECT_EQ(document["steps"][3]["events"][0], nlohmann::json::parse(R"({
       "event": "ask_device", "subject": "DiskUsage", "value": {"TotalDiskCapacity": 1048576}})"));
   EXPECT_EQ(device.files(), before);
 

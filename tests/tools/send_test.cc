@@ -2,7 +2,7 @@
 
 #include "base/text.h"
 #include "device.h"
-#include "platform/linux/socket_service.h"
+#include "platform/linux/service/socket_service.h"
 
 namespace tavrel {
 namespace {

@@ -4,11 +4,11 @@
 #include <limits>
 #include <sstream>
 
-#include "tools/base64.h"
-#include "tools/day_argument.h"
-#include "tools/json_value.h"
-#include "tools/table.h"
-#include "tools/value_text.h"
+#include "tools/shared/base64.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

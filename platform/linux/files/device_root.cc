@@ -1,0 +1,32 @@
+#include "platform/linux/files/device_root.h"
+
+#include <cstdlib>
+#include <unistd.h>
+#include <utility>
+
+namespace tavrel {
+
+DeviceRoot::DeviceRoot(std::string root) : root_(std::move(root)) {
+  while (!root_.empty() && root_.back() == '/')
+    root_.pop_back();
+}
+
+DeviceRoot DeviceRoot::fromEnvironment() {
+  const char* root = std::getenv("TAVREL_ROOT");
+  return DeviceRoot(root ? root : "/");
+}
+
+std::string DeviceRoot::path(std::string_view devicePath) const {
+  std::string path = root_;
+  if (!devicePath.starts_with('/')) path += '/';
+  path += devicePath;
+  return path;
+}
+
+std::string DeviceRoot::pathOrMachine(std::string_view devicePath) const {
+  std::string below = path(devicePath);
+  if (root_.empty() || ::access(below.c_str(), F_OK) == 0) return below;
+  return std::string(devicePath);
+}
+
+}  // namespace tavrel

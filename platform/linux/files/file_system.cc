@@ -1,0 +1,380 @@
+#include "platform/linux/files/file_system.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstdio>
+#include <dirent.h>
+#include <fcntl.h>
+#include <memory>
+#include <sys/file.h>
+#include <time.h>
+
+#include "base/limits.h"
+#include "platform/linux/files/random.h"
+#include "platform/linux/files/system_error.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kTemporaryPrefix = ".tavrel-";
+constexpr std::string_view kTemporarySuffix = ".tmp";
+
+// Opening must neither wait for the other end of a FIFO nor make a terminal the controlling one.
+constexpr int kOpenSafely = O_NONBLOCK | O_NOCTTY;
+
+std::string folderOf(const std::string& path) {
+  const std::size_t slash = path.rfind('/');
+  if (slash == std::string::npos) return ".";
+  return slash == 0 ? "/" : path.substr(0, slash);
+}
+
+bool isTemporary(std::string_view name) {
+  return name.size() > kTemporaryPrefix.size() + kTemporarySuffix.size() &&
+         name.starts_with(kTemporaryPrefix) && name.ends_with(kTemporarySuffix);
+}
+
+Error notRegular(const std::string& path, mode_t mode) {
+  const char* kind = S_ISDIR(mode) ? "a folder" : "not a regular file";
+  return Error{"cannot use " + path + ": it is " + kind + "; move it away"};
+}
+
+Error tooLarge(const std::string& path, std::size_t largest) {
+  return Error{"cannot use " + path + ": it has more than " + std::to_string(largest) +
+               " bytes; move it away"};
+}
+
+using Folder = std::unique_ptr<DIR, decltype([](DIR* folder) { closedir(folder); })>;
+
+std::int64_t monotonicMilliseconds() {
+  timespec now{};
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  return std::int64_t{now.tv_sec} * 1000 + now.tv_nsec / 1'000'000;
+}
+
+}  // namespace
+
+// -- New files ----------------------------------------------------------------------------------
+
+NewFile::NewFile(FileSystem& fileSystem, std::string path, std::string temporary,
+                 Descriptor descriptor)
+    : fileSystem_(fileSystem),
+      path_(std::move(path)),
+      temporary_(std::move(temporary)),
+      descriptor_(std::move(descriptor)) {}
+
+NewFile::NewFile(NewFile&& other) noexcept
+    : fileSystem_(other.fileSystem_),
+      path_(std::move(other.path_)),
+      temporary_(std::exchange(other.temporary_, {})),
+      descriptor_(std::move(other.descriptor_)),
+      flushed_(other.flushed_) {}
+
+NewFile::~NewFile() {
+  if (!temporary_.empty()) fileSystem_.removeFile(temporary_.c_str());
+}
+
+Status NewFile::write(ByteSpan bytes) {
+  flushed_ = false;
+  return fileSystem_.writeAll(descriptor_.get(), bytes, path_);
+}
+
+Status NewFile::flush() {
+  if (flushed_) return Done{};
+  if (fileSystem_.syncFile(descriptor_.get()) != 0) return systemError("flush", path_);
+  flushed_ = true;
+  return Done{};
+}
+
+Status NewFile::commit() {
+  if (Status flushed = flush(); !flushed) return flushed;
+  if (fileSystem_.renameFile(temporary_.c_str(), path_.c_str()) != 0) {
+    return systemError("put in place", path_);
+  }
+  temporary_.clear();
+  descriptor_.reset();
+  return fileSystem_.syncFolderOf(path_);
+}
+
+// -- Files that grow ------------------------------------------------------------------------------
+
+Status AppendedFile::append(ByteSpan bytes, std::size_t largest) {
+  std::string line;
+  char last = '\n';
+  if (size_ > 0 && !isLineEnded_ &&
+      pread(descriptor_.get(), &last, 1, static_cast<off_t>(size_ - 1)) == 1 && last != '\n') {
+    line = '\n';
+    line += asText(bytes);
+    bytes = asBytes(line);
+  }
+  if (bytes.size() > largest || size_ > largest - bytes.size()) {
+    return Error{"cannot append to " + path_ + ": it may have " + std::to_string(largest) +
+                 " bytes"};
+  }
+  if (Status written = fileSystem_->writeAll(descriptor_.get(), bytes, path_); !written) {
+    fileSystem_->truncateFile(descriptor_.get(), static_cast<off_t>(size_));
+    struct stat status {};
+    if (fstat(descriptor_.get(), &status) == 0) size_ = static_cast<std::uint64_t>(status.st_size);
+    isLineEnded_ = false;
+    return written;
+  }
+  size_ += bytes.size();
+  isLineEnded_ = !bytes.empty() && bytes.back() == std::byte{'\n'};
+  return Done{};
+}
+
+Status AppendedFile::flush() {
+  if (fileSystem_->syncFile(descriptor_.get()) != 0) return systemError("flush", path_);
+  return fileSystem_->syncFolderOf(path_);
+}
+
+// -- Reading ------------------------------------------------------------------------------------
+
+Expected<std::optional<std::string>> FileSystem::readIfPresent(const std::string& path,
+                                                               std::size_t largest) {
+  Descriptor descriptor(openFile(path.c_str(), O_RDONLY | kOpenSafely, 0));
+  if (!descriptor) {
+    if (errno == ENOENT || errno == ENOTDIR) return std::optional<std::string>();
+    return systemError("read", path);
+  }
+  struct stat status {};
+  if (fstat(descriptor.get(), &status) != 0) return systemError("read", path);
+  if (!S_ISREG(status.st_mode)) return notRegular(path, status.st_mode);
+  const auto size = static_cast<std::uint64_t>(std::max<off_t>(status.st_size, 0));
+  if (size > largest) return tooLarge(path, largest);
+
+  // One byte more than the file should have, so that the usual file ends with the first read. The
+  // kernel's own files give no size in advance.
+  std::string content;
+  std::size_t filled = 0;
+  std::size_t room = std::max<std::size_t>(static_cast<std::size_t>(size), 511) + 1;
+  while (true) {
+    content.resize(room);
+    const ssize_t got = ::read(descriptor.get(), content.data() + filled, room - filled);
+    if (got < 0) {
+      if (errno == EINTR) continue;
+      return systemError("read", path);
+    }
+    if (got == 0) break;
+    filled += static_cast<std::size_t>(got);
+    if (filled > largest) return tooLarge(path, largest);
+    if (filled == room) room *= 2;
+  }
+  content.resize(filled);
+  return std::optional(std::move(content));
+}
+
+Expected<std::string> FileSystem::read(const std::string& path, std::size_t largest) {
+  auto content = readIfPresent(path, largest);
+  if (!content) return content.error();
+  if (!*content) return systemError("read", path, ENOENT);
+  return *std::move(*content);
+}
+
+Expected<std::vector<std::string>> FileSystem::list(const std::string& folder) {
+  std::vector<std::string> names;
+  const Folder open(opendir(folder.c_str()));
+  if (!open) {
+    if (errno == ENOENT) return names;
+    return systemError("list", folder);
+  }
+  errno = 0;
+  while (const dirent* entry = readdir(open.get())) {
+    if (entry->d_name[0] != '.') names.emplace_back(entry->d_name);
+  }
+  if (errno != 0) return systemError("list", folder);
+  std::sort(names.begin(), names.end());
+  return names;
+}
+
+std::optional<struct stat> FileSystem::status(const std::string& path) {
+  struct stat status {};
+  if (::stat(path.c_str(), &status) != 0) return std::nullopt;
+  return status;
+}
+
+// -- Writing ------------------------------------------------------------------------------------
+
+Expected<NewFile> FileSystem::create(const std::string& path, mode_t mode) {
+  const std::string folder = folderOf(path);
+  bool foldersMade = false;
+  while (true) {
+    std::string temporary = folder + "/";
+    temporary += kTemporaryPrefix;
+    temporary += randomName();
+    temporary += kTemporarySuffix;
+    Descriptor descriptor(
+        openFile(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | kOpenSafely, mode));
+    if (!descriptor) {
+      if (errno == EEXIST) continue;
+      if (errno != ENOENT || foldersMade) return systemError("write", path);
+      if (Status made = makeFolders(folder); !made) return made.error();
+      foldersMade = true;
+      continue;
+    }
+
+    struct stat fresh {};
+    if (fstat(descriptor.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
+      removeStaleTemporaries(folder, fresh);
+    }
+    // Owner first: giving a file away takes set-user bits from its mode.
+    if (const auto former = status(path); former && S_ISREG(former->st_mode)) {
+      if ((former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) &&
+          fchown(descriptor.get(), former->st_uid, former->st_gid) != 0) {
+        // Only root can; for others the new file is their own.
+      }
+      if (fchmod(descriptor.get(), former->st_mode & 07777U) != 0) {
+        const Error error = systemError("set the mode of", path);
+        removeFile(temporary.c_str());
+        return error;
+      }
+    }
+    return NewFile(*this, path, std::move(temporary), std::move(descriptor));
+  }
+}
+
+Status FileSystem::replace(const std::string& path, ByteSpan bytes, mode_t mode) {
+  Expected<NewFile> file = create(path, mode);
+  if (!file) return file.error();
+  if (Status written = file->write(bytes); !written) return written;
+  return file->commit();
+}
+
+Expected<Descriptor> FileSystem::openOrMake(const std::string& path, int flags, mode_t mode) {
+  Descriptor descriptor(openFile(path.c_str(), flags | O_CREAT | kOpenSafely, mode));
+  if (!descriptor && errno == ENOENT) {
+    if (Status made = makeFolders(folderOf(path)); !made) return made.error();
+    descriptor = Descriptor(openFile(path.c_str(), flags | O_CREAT | kOpenSafely, mode));
+  }
+  if (!descriptor) return systemError("write", path);
+  return descriptor;
+}
+
+Expected<AppendedFile> FileSystem::openToAppend(const std::string& path, mode_t mode) {
+  Expected<Descriptor> descriptor = openOrMake(path, O_RDWR | O_APPEND, mode);
+  if (!descriptor) return descriptor.error();
+  if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
+  struct stat status {};
+  if (fstat(descriptor->get(), &status) != 0) return systemError("write", path);
+  if (!S_ISREG(status.st_mode)) return notRegular(path, status.st_mode);
+  return AppendedFile(*this, path, *std::move(descriptor),
+                      static_cast<std::uint64_t>(status.st_size));
+}
+
+Status FileSystem::rename(const std::string& from, const std::string& to) {
+  if (renameFile(from.c_str(), to.c_str()) != 0) {
+    const int code = errno;
+    return systemError("move " + from + " to", to, code);
+  }
+  if (Status synced = syncFolderOf(to); !synced) return synced;
+  if (folderOf(from) == folderOf(to)) return Done{};
+  return syncFolderOf(from);
+}
+
+Status FileSystem::remove(const std::string& path) {
+  if (removeFile(path.c_str()) != 0 && errno != ENOENT) return systemError("remove", path);
+  return Done{};
+}
+
+Status FileSystem::makeFolders(const std::string& path) {
+  if (makeFolder(path.c_str(), 0755) == 0) return syncFolderOf(path);
+  if (errno == EEXIST) return Done{};
+  const std::string parent = folderOf(path);
+  if (errno != ENOENT || parent == path) return systemError("make the folder", path);
+  if (Status made = makeFolders(parent); !made) return made;
+  if (makeFolder(path.c_str(), 0755) != 0 && errno != EEXIST) {
+    return systemError("make the folder", path);
+  }
+  return syncFolderOf(path);
+}
+
+Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
+  Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, 0600);
+  if (!descriptor) return descriptor;
+  if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
+  return descriptor;
+}
+
+Status FileSystem::lock(int descriptor, const std::string& path) {
+  const std::int64_t end = monotonicMilliseconds() + limits::kFileLockMilliseconds;
+  while (flock(descriptor, LOCK_EX | LOCK_NB) != 0) {
+    if (errno == EINTR) continue;
+    if (errno != EWOULDBLOCK) return systemError("lock", path);
+    if (monotonicMilliseconds() > end) {
+      return Error{"cannot lock " + path + ": another process has held it for " +
+                   std::to_string(limits::kFileLockMilliseconds / 1000) + " seconds; end it"};
+    }
+    constexpr timespec kPause{0, 2'000'000};
+    nanosleep(&kPause, nullptr);
+  }
+  return Done{};
+}
+
+Status FileSystem::writeAll(int descriptor, ByteSpan bytes, const std::string& path) {
+  while (!bytes.empty()) {
+    const ssize_t written = writeFile(descriptor, bytes.data(), bytes.size());
+    if (written < 0) {
+      if (errno == EINTR) continue;
+      return systemError("write", path);
+    }
+    bytes = bytes.subspan(static_cast<std::size_t>(written));
+  }
+  return Done{};
+}
+
+Status FileSystem::syncFolderOf(const std::string& path) {
+  const std::string folder = folderOf(path);
+  const Descriptor descriptor(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
+  if (!descriptor) return systemError("flush the folder", folder);
+  // Some file systems have no flush for folders, and say so.
+  if (syncFile(descriptor.get()) != 0 && errno != EINVAL) {
+    return systemError("flush the folder", folder);
+  }
+  return Done{};
+}
+
+// The age is taken by the file system's own clock, as it stamped a file made just now: the
+// process's clock may be shifted, and a temporary file that another process is writing is young.
+void FileSystem::removeStaleTemporaries(const std::string& folder, const struct stat& fresh) {
+  const Folder open(opendir(folder.c_str()));
+  if (!open) return;
+  while (const dirent* entry = readdir(open.get())) {
+    if (!isTemporary(entry->d_name)) continue;
+    const std::string path = folder + "/" + entry->d_name;
+    struct stat found {};
+    if (lstat(path.c_str(), &found) != 0 || !S_ISREG(found.st_mode)) continue;
+    const std::int64_t age = std::int64_t{fresh.st_mtim.tv_sec} - found.st_mtim.tv_sec;
+    if (age > limits::kTemporaryFileSeconds || age < -limits::kTemporaryFileSeconds) {
+      removeFile(path.c_str());
+    }
+  }
+}
+
+// -- The system's calls -------------------------------------------------------------------------
+
+int FileSystem::openFile(const char* path, int flags, mode_t mode) {
+  int descriptor = -1;
+  do {
+    descriptor = ::open(path, flags | O_CLOEXEC, mode);
+  } while (descriptor < 0 && errno == EINTR);
+  return descriptor;
+}
+ssize_t FileSystem::writeFile(int descriptor, const std::byte* bytes, std::size_t size) {
+  return ::write(descriptor, bytes, size);
+}
+int FileSystem::syncFile(int descriptor) {
+  return ::fsync(descriptor);
+}
+int FileSystem::truncateFile(int descriptor, off_t size) {
+  return ::ftruncate(descriptor, size);
+}
+int FileSystem::renameFile(const char* from, const char* to) {
+  return ::rename(from, to);
+}
+int FileSystem::removeFile(const char* path) {
+  return ::unlink(path);
+}
+int FileSystem::makeFolder(const char* path, mode_t mode) {
+  return ::mkdir(path, mode);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,156 @@
+// Durable files. Whatever the platform writes goes through here, so that a reader never sees half
+// a file and a power cut leaves either the old content or the new.
+//
+// A file is replaced by writing a temporary file beside it, flushing that, renaming it over the
+// file and flushing the folder:
+//
+//   if (Status done = files.replace(path, bytes, 0644); !done) log.write(...,
+//   done.error().message);
+//
+// or piece by piece, where a file that is not committed vanishes with its handle:
+//
+//   Expected<NewFile> file = files.create(path, 0640);
+//   file->write(bytes);
+//   file->commit();
+//
+// Every error names the path and carries the system's own words. The calls to the system are
+// virtual: tests derive one that loses what was not flushed and one whose n-th call fails.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <set>
+#include <string>
+#include <string_view>
+#include <sys/stat.h>
+#include <sys/types.h>
+#include <utility>
+#include <vector>
+
+#include "base/bytes.h"
+#include "base/expected.h"
+#include "platform/linux/files/descriptor.h"
+
+namespace tavrel {
+
+class FileSystem;
+
+/// A file that does not exist under its name yet. Without `commit` nothing is left of it.
+class NewFile {
+ public:
+  NewFile(NewFile&& other) noexcept;
+  NewFile& operator=(NewFile&&) = delete;
+  ~NewFile();
+
+  /// Appends all of `bytes`.
+  Status write(ByteSpan bytes);
+  /// Writes the content through to storage, still without its name.
+  Status flush();
+  /// Flushes, then gives the file its name in the place of an earlier one and makes that durable.
+  /// When only the last step fails the file is in place, but may not survive a power cut.
+  Status commit();
+
+ private:
+  friend class FileSystem;
+  NewFile(FileSystem& fileSystem, std::string path, std::string temporary, Descriptor descriptor);
+
+  FileSystem& fileSystem_;
+  std::string path_;
+  std::string temporary_;  // empty once there is nothing to remove
+  Descriptor descriptor_;
+  bool flushed_ = false;
+};
+
+/// A file that grows by whole entries. It is locked until the handle is released, so that whoever
+/// appends in the same way waits; reading goes on.
+class AppendedFile {
+ public:
+  /// Appends `bytes` in one write, which survives the end of the process but not of the power. When
+  /// they do not fit, nothing of them is left. A last line that a power cut left without its end
+  /// gets one first. Nothing is appended beyond `largest` bytes.
+  Status append(ByteSpan bytes, std::size_t largest);
+  /// Writes the file and its name through to storage.
+  Status flush();
+
+ private:
+  friend class FileSystem;
+  AppendedFile(FileSystem& fileSystem, std::string path, Descriptor descriptor, std::uint64_t size)
+      : fileSystem_(&fileSystem),
+        path_(std::move(path)),
+        descriptor_(std::move(descriptor)),
+        size_(size) {}
+
+  FileSystem* fileSystem_;
+  std::string path_;
+  Descriptor descriptor_;
+  std::uint64_t size_;
+  bool isLineEnded_ = false;  // known to be; else to be looked at
+};
+
+class FileSystem {
+ public:
+  FileSystem() = default;
+  virtual ~FileSystem() = default;
+  FileSystem(const FileSystem&) = delete;
+  FileSystem& operator=(const FileSystem&) = delete;
+
+  /// The whole content of a regular file; anything else in its place is refused unread. Larger
+  /// than `largest` bytes is an error.
+  Expected<std::string> read(const std::string& path, std::size_t largest);
+  /// The same, nothing when there is no such file.
+  Expected<std::optional<std::string>> readIfPresent(const std::string& path, std::size_t largest);
+
+  /// Begins a new content of `path`. Missing folders are made. Temporary files that a killed
+  /// process left in the folder are removed once they are older than
+  /// `limits::kTemporaryFileSeconds`.
+  Expected<NewFile> create(const std::string& path, mode_t mode);
+  /// A file that exists keeps its mode and owner; `mode` is for a new one.
+  Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
+
+  /// Opens a file to append to it; it and its folder are made when missing. Waits for another
+  /// process at most `limits::kFileLockMilliseconds`.
+  Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
+
+  /// Moves a file, over an existing one, and makes that durable.
+  Status rename(const std::string& from, const std::string& to);
+  /// Removes a file; a missing one is fine. Durable with the folder's next flush.
+  Status remove(const std::string& path);
+  /// The same for what is only in the way: a failure is for the next clean-up.
+  void discard(const std::string& path) { removeFile(path.c_str()); }
+  /// Makes a folder and those above it.
+  Status makeFolders(const std::string& path);
+
+  /// Takes the lock file `path`, made when missing, until the handle is released. Waits for another
+  /// process at most `limits::kFileLockMilliseconds`.
+  Expected<Descriptor> lockFile(const std::string& path);
+
+  /// Names in a folder, sorted, without those that begin with a dot; none in a missing folder.
+  Expected<std::vector<std::string>> list(const std::string& folder);
+
+  /// Status of a file, links followed; nothing when it cannot be taken.
+  static std::optional<struct stat> status(const std::string& path);
+
+ protected:
+  /// The system's calls: -1 with `errno` on failure. `openFile` sets close-on-exec.
+  virtual int openFile(const char* path, int flags, mode_t mode);
+  virtual ssize_t writeFile(int descriptor, const std::byte* bytes, std::size_t size);
+  virtual int syncFile(int descriptor);
+  virtual int truncateFile(int descriptor, off_t size);
+  virtual int renameFile(const char* from, const char* to);
+  virtual int removeFile(const char* path);
+  virtual int makeFolder(const char* path, mode_t mode);
+
+ private:
+  friend class AppendedFile;
+  friend class NewFile;
+  Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
+  Status lock(int descriptor, const std::string& path);
+  Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
+  Status syncFolderOf(const std::string& path);
+  void removeStaleTemporaries(const std::string& folder, const struct stat& fresh);
+
+  std::set<std::string> tidiedFolders_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,77 @@
+#include "platform/linux/files/line_reader.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+#include <utility>
+
+#include "base/limits.h"
+
+namespace tavrel {
+
+std::string_view trimmed(std::string_view text) {
+  constexpr std::string_view kBlank = " \t\r";
+  const std::size_t first = text.find_first_not_of(kBlank);
+  if (first == std::string_view::npos) return {};
+  return text.substr(first, text.find_last_not_of(kBlank) - first + 1);
+}
+
+LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
+  // Opening a pipe that nobody writes to would otherwise wait for a writer.
+  descriptor_ = Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  struct stat status {};
+  if (!descriptor_ || fstat(descriptor_.get(), &status) != 0) {
+    errorNumber_ = errno;
+  } else if (!S_ISREG(status.st_mode)) {
+    errorNumber_ = EINVAL;
+  } else if (static_cast<std::uint64_t>(status.st_size) > largest) {
+    errorNumber_ = EFBIG;
+  } else {
+    buffer_ = std::make_unique_for_overwrite<char[]>(limits::kTextLineBytes);
+  }
+}
+
+std::optional<std::string_view> LineReader::next() {
+  if (errorNumber_ != 0) return std::nullopt;
+  while (true) {
+    const std::string_view rest(buffer_.get() + begin_, end_ - begin_);
+    const std::size_t newline = rest.find('\n');
+    if (newline != std::string_view::npos) {
+      begin_ += newline + 1;
+      if (std::exchange(insideCutLine_, false)) continue;
+      return rest.substr(0, newline);
+    }
+    if (rest.size() == limits::kTextLineBytes) {
+      begin_ = end_ = 0;
+      if (std::exchange(insideCutLine_, true)) continue;
+      return rest;
+    }
+    if (!fill()) {
+      begin_ = end_ = 0;
+      if (errorNumber_ != 0 || rest.empty() || insideCutLine_) return std::nullopt;
+      return std::string_view(buffer_.get(), rest.size());
+    }
+  }
+}
+
+bool LineReader::fill() {
+  std::memmove(buffer_.get(), buffer_.get() + begin_, end_ - begin_);
+  end_ -= begin_;
+  begin_ = 0;
+  const std::size_t room =
+      static_cast<std::size_t>(std::min<std::uint64_t>(limits::kTextLineBytes - end_, left_));
+  ssize_t count = 0;
+  do {
+    count = read(descriptor_.get(), buffer_.get() + end_, room);
+  } while (count < 0 && errno == EINTR);
+  if (count < 0) errorNumber_ = errno;
+  if (count <= 0) return false;
+  end_ += static_cast<std::size_t>(count);
+  left_ -= static_cast<std::uint64_t>(count);
+  return true;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,47 @@
+// Lines of a text file, read in one pass with a buffer of fixed size.
+//
+//   LineReader lines(path);
+//   while (const auto line = lines.next()) use(*line);
+//   if (lines.errorNumber() != 0) ...
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/linux/files/descriptor.h"
+
+namespace tavrel {
+
+/// A line, or a part of it, without spaces, tabs and carriage returns at its ends.
+std::string_view trimmed(std::string_view text);
+
+class LineReader {
+ public:
+  /// Only regular files are read; a folder, a pipe or a device fails with EINVAL, a file of more
+  /// than `largest` bytes with EFBIG.
+  explicit LineReader(const std::string& path, std::uint64_t largest = UINT64_MAX);
+
+  /// The next line without its end, valid until the next call. A line that is longer than
+  /// `limits::kTextLineBytes` is cut. Nothing at the end of the file and after a failure.
+  std::optional<std::string_view> next();
+
+  /// Why the file could not be opened or read on, 0 when nothing failed.
+  int errorNumber() const { return errorNumber_; }
+
+ private:
+  bool fill();
+
+  Descriptor descriptor_;
+  int errorNumber_ = 0;
+  std::uint64_t left_;  // bytes that may still be read, should the file grow
+  std::unique_ptr<char[]> buffer_;
+  std::size_t begin_ = 0;
+  std::size_t end_ = 0;
+  bool insideCutLine_ = false;
+};
+
+}  // namespace tavrel

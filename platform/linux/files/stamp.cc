@@ -1,0 +1,34 @@
+#include "platform/linux/files/stamp.h"
+
+#include <cmath>
+
+#include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "base/format.h"
+
+namespace tavrel {
+
+std::int64_t wholeSeconds(plist::Date instant) {
+  return saturatingInt64(std::floor(instant.secondsSince1970()));
+}
+
+std::string compactStamp(plist::Date instant) {
+  const CivilTime time = civilFromSeconds(wholeSeconds(instant));
+  return format("%04lld%02u%02uT%02u%02u%02uZ", time.date.year, time.date.month, time.date.day,
+                time.hour, time.minute, time.second);
+}
+
+std::string preciseStamp(plist::Date instant) {
+  const std::int64_t seconds = wholeSeconds(instant);
+  const CivilTime time = civilFromSeconds(seconds);
+  const double fraction = instant.secondsSince1970() - static_cast<double>(seconds);
+  const auto milliseconds = static_cast<unsigned>(saturatingInt64(fraction * 1000.0)) % 1000U;
+  return format("%sT%02u:%02u:%02u.%03uZ", dateText(time.date), time.hour, time.minute, time.second,
+                milliseconds);
+}
+
+std::int64_t dayOf(plist::Date instant) {
+  return daysFromCivil(civilFromSeconds(wholeSeconds(instant)).date);
+}
+
+}  // namespace tavrel

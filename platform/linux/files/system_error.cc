@@ -1,0 +1,36 @@
+#include "platform/linux/files/system_error.h"
+
+#include <system_error>
+
+namespace tavrel {
+namespace {
+
+std::string_view adviceFor(int code) {
+  switch (code) {
+    case EACCES:
+    case EPERM:
+      return "; run as root or as the owner of the files";
+    case ENOSPC:
+    case EDQUOT:
+      return "; free some space";
+    case EROFS:
+      return "; make the file system writable";
+    default:
+      return "";
+  }
+}
+
+}  // namespace
+
+Error systemError(std::string_view what, std::string_view path, int code) {
+  std::string message = "cannot ";
+  message += what;
+  message += ' ';
+  message += path;
+  message += ": ";
+  message += std::generic_category().message(code);
+  message += adviceFor(code);
+  return Error{std::move(message)};
+}
+
+}  // namespace tavrel

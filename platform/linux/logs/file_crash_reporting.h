@@ -1,0 +1,76 @@
+// Crash-reporting support on files.
+//
+// Structured records are lines of JSON in
+// /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
+// and day. Each is with the kernel when its call returns; they are written through to storage
+// together, at the clean-up that ends a day's work or with the process. Until then their files are
+// locked. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/
+// support.log, is rolled to support.log.1 and on to support.log.5.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/clock.h"
+#include "platform/crash_reporting.h"
+#include "platform/linux/device/linux_system_version.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class FileCrashReporting final : public CrashReporting {
+ public:
+  /// Days for which structured records are kept.
+  static constexpr std::int64_t kDaysKept = 30;
+  /// Rolled support logs that are kept.
+  static constexpr int kSupportLogsKept = 5;
+
+  FileCrashReporting(const DeviceRoot& root, FileSystem& files, LinuxSystemVersion& systemVersion,
+                     Clock& clock, SystemLog& log)
+      : root_(root), files_(files), systemVersion_(systemVersion), clock_(clock), log_(log) {}
+  ~FileCrashReporting() override;
+
+  void FLLogStructuredData(std::uint32_t logType, const plist::Dictionary& record) override;
+  void FLDumpAllOldStructuredDataLogs() override;
+  void rollNorvaneCareLogs() override;
+
+  /// The files that the clean-up removes, without their folder.
+  std::vector<std::string> oldRecordFiles();
+
+  /// Whether there is a support log with something in it, which is what rolls.
+  bool hasSupportLog();
+
+  /// Derived from the machine's identifier, which itself never leaves the device: a UUID that is
+  /// the same at every call; "unknown" on a machine without one.
+  std::string systemIdentifier() override;
+  /// As firmware names it; "unknown" when it does not.
+  std::string hardwareModel() override;
+  std::string osVersion() override;
+  std::string incidentIdentifier() override;
+
+ private:
+  struct RecordFile {
+    std::int64_t day;
+    std::optional<AppendedFile> file;  // nothing when it cannot be used
+    bool isRefusalTold = false;
+  };
+
+  RecordFile& recordFile(std::uint32_t type, std::int64_t day);
+  void flush(RecordFile& file);
+  void flushRecords();
+  std::string fact(std::string_view devicePath);
+
+  const DeviceRoot& root_;
+  FileSystem& files_;
+  LinuxSystemVersion& systemVersion_;
+  Clock& clock_;
+  SystemLog& log_;
+  std::map<std::uint32_t, RecordFile> recordFiles_;  // by type
+};
+
+}  // namespace tavrel

@@ -1,0 +1,78 @@
+// Diagnostic-log submission through folders.
+//
+// Finished logs wait in /var/mobile/Library/Logs/Submission/pending/ and go on from
+// .../Submission/outbox/, which an uploader empties. A log is "<name>-<stamp>-<unique>.log"; its
+// metadata is a property list beside it, "<name>-<stamp>-<unique>.metadata.plist".
+//
+// The metadata is put in place before the log and taken away after it. So whoever finds a log finds
+// its metadata; metadata without a log is what a killed process left, means nothing, and is removed
+// once it is older than `limits::kTemporaryFileSeconds`.
+#pragma once
+
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/clock.h"
+#include "platform/linux/device/linux_system_version.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/preferences.h"
+#include "platform/property_list_coding.h"
+#include "platform/submission.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+/// Entries of a log's metadata.
+inline constexpr std::string_view kLogMetadataType = "LogType";       // string
+inline constexpr std::string_view kLogMetadataName = "LogName";       // string
+inline constexpr std::string_view kLogMetadataTime = "Time";          // date
+inline constexpr std::string_view kLogMetadataVersion = "OSVersion";  // string
+inline constexpr std::string_view kLogMetadataOptions = "Options";    // dictionary, when given
+
+class FileSubmission final : public SubmissionService {
+ public:
+  enum class Place { Pending, Outbox };
+
+  /// A log that has been filed.
+  struct FiledLog {
+    Place place;
+    std::string name;            // of its file, without the ending
+    std::string path;            // on this machine
+    plist::Dictionary metadata;  // empty when missing or unreadable
+  };
+
+  FileSubmission(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
+                 Preferences& preferences, LinuxSystemVersion& systemVersion, Clock& clock,
+                 SystemLog& log);
+
+  bool isDiagnosticSubmissionEnabled() override;
+  bool hasInternalDiagnostics(std::string_view identifier) override;
+  bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
+                                const plist::Dictionary& options, const LogWriter& writer) override;
+  std::string ZTXOSVersion() override;
+  plist::Value ZTXGetDATaskingValue(std::string_view key) override;
+  void submitDiagnosticLogs() override;
+
+  /// The logs of one place, oldest first.
+  Expected<std::vector<FiledLog>> logs(Place place);
+
+ private:
+  std::string folder(Place place) const;
+  Status fileLog(std::string_view logType, std::string_view logName,
+                 const plist::Dictionary& options, const LogWriter& writer);
+  Status moveToOutbox(const std::string& name);
+  void removeOldMetadata(const std::string& freshMetadata);
+
+  std::string folder_;
+  FileSystem& files_;
+  PropertyListCoding& propertyLists_;
+  Preferences& preferences_;
+  LinuxSystemVersion& systemVersion_;
+  Clock& clock_;
+  SystemLog& log_;
+};
+
+}  // namespace tavrel

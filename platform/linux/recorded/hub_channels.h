@@ -1,0 +1,59 @@
+// The channels that a recorded hub knows, with the elements that each shows at every update.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string_view>
+#include <unordered_map>
+
+#include "base/bytes.h"
+#include "base/keyed_hash.h"
+#include "base/plist.h"
+#include "platform/linux/system_log/refusal_log.h"
+
+namespace tavrel {
+
+/// One channel's elements: a group for the first update, one for the second, and so on.
+class HubChannel {
+ public:
+  explicit HubChannel(plist::Value elements);
+
+  /// The group that update number `update` shows, from 0. The last one stays.
+  ByteSpan group(std::size_t update) const;
+  std::size_t largestGroup() const { return largest_; }
+
+ private:
+  plist::Value elements_;  // data, or an array of data
+  std::size_t largest_ = 0;
+};
+
+class HubChannels {
+ public:
+  /// Takes in the "Channels" of a recording. A channel that is known already, or whose elements are
+  /// no whole group of its own, is left out with a line.
+  void add(const plist::Array& channels, std::string_view origin, RefusalLog& refusals);
+
+  /// Null when the hub does not know the channel.
+  const HubChannel* find(std::uint64_t driverID, std::uint64_t channelID) const;
+
+ private:
+  struct Key {
+    std::uint64_t driverID;
+    std::uint64_t channelID;
+    bool operator==(const Key&) const = default;
+  };
+  struct KeyHash {
+    // Whoever writes a recording chooses the ids.
+    std::size_t operator()(const Key& key) const {
+      return keyedHash(asText(std::as_bytes(std::span(&key, 1))));
+    }
+  };
+
+  /// What is wrong with an entry; null when it was taken.
+  const char* addOne(const plist::Dictionary& channel);
+
+  std::unordered_map<Key, HubChannel, KeyHash> channels_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,64 @@
+// What the recordings of a registry hold, taken together and indexed: services by entry id and by
+// class, and the channels of the hub. docs/registry.md describes the format.
+//
+// The dictionaries of a recording are shared with it, not copied. An entry that cannot be played is
+// left out, and a line in the system log says so. Of the hub only the malformed field is left out.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "base/keyed_hash.h"
+#include "base/plist.h"
+#include "platform/linux/recorded/hub_channels.h"
+#include "platform/linux/system_log/refusal_log.h"
+
+namespace tavrel {
+
+/// One recorded document and what messages call it, such as its path.
+struct RecordingPart {
+  std::string origin;
+  plist::Dictionary content;
+};
+
+struct RecordedEntry {
+  plist::Dictionary record;
+  std::string className;
+  std::optional<std::uint64_t> entryID;
+  std::vector<plist::Dictionary> rows = {};  // of its "Methods"
+  bool isHub = false;
+};
+
+class Recording {
+ public:
+  Recording(std::span<const RecordingPart> parts, SystemLog& log);
+
+  const std::vector<RecordedEntry>& services() const { return services_; }
+  /// Positions in `services`, in their order.
+  std::span<const std::size_t> servicesOfClass(std::string_view className) const;
+  /// The first service with that entry id; null when there is none.
+  const RecordedEntry* serviceWithID(std::uint64_t entryID) const;
+  const HubChannels& hubChannels() const { return hubChannels_; }
+
+ private:
+  void add(RecordedEntry entry, std::string_view origin, RefusalLog& refusals);
+
+  std::vector<RecordedEntry> services_;
+  std::unordered_map<std::uint64_t, std::size_t> byID_;
+  std::unordered_map<std::string, std::vector<std::size_t>, KeyedHash> byClass_;
+  HubChannels hubChannels_;
+};
+
+/// All parts as one recording, which plays back what they play together.
+plist::Dictionary mergedRecording(std::span<const RecordingPart> parts);
+
+/// The sum of the parts' generations, in two's complement.
+std::uint64_t generationOf(std::span<const RecordingPart> parts);
+
+}  // namespace tavrel

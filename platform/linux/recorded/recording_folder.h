@@ -1,0 +1,50 @@
+// The folder of recordings, /var/lib/tavrel/registry under the device root.
+#pragma once
+
+#include <cstdint>
+#include <ctime>
+#include <string>
+#include <sys/types.h>
+#include <vector>
+
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/recorded/recording.h"
+#include "platform/property_list_coding.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class RecordingFolder {
+ public:
+  RecordingFolder(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
+                  SystemLog& log)
+      : root_(root), files_(files), propertyLists_(propertyLists), log_(log) {}
+
+  /// Brings `parts` up to date with the "*.plist" files of the folder, in the order of their names.
+  /// Only files that were replaced or changed are read. Answers whether anything was.
+  bool update(std::vector<RecordingPart>& parts);
+
+ private:
+  /// Tells one content of a file from another.
+  struct Stamp {
+    std::string path;
+    dev_t device;
+    ino_t inode;
+    off_t size;
+    std::time_t seconds;
+    long nanoseconds;
+    bool operator==(const Stamp&) const = default;
+  };
+
+  std::vector<Stamp> stampFiles();
+
+  const DeviceRoot& root_;
+  FileSystem& files_;
+  PropertyListCoding& propertyLists_;
+  SystemLog& log_;
+  std::vector<Stamp> stamps_;  // one for each part
+  std::string complaint_;      // the last one, so that it is not repeated at every update
+};
+
+}  // namespace tavrel

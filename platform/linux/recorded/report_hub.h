@@ -1,0 +1,29 @@
+// A connection to the recorded reporting hub, the service of class "IOReportHub".
+//
+//   method 0: opens the hub for this connection; the others are refused before
+//   method 2: takes the channels of interest, makes a buffer for their elements and answers its id
+//   method 3: with a buffer's id, brings the elements in that buffer up to date
+//
+// platform/report_protocol.h has the forms of what is exchanged.
+//
+// The buffer holds one group of elements for each channel that the hub knows, in the order of
+// interest; channels that it does not know are left out. The first update shows the first group of
+// each channel's sequence, the next one the second, and so on for each buffer on its own. As groups
+// of one channel may differ in length, the buffer has room for the longest; what is free behind the
+// last group is covered by groups of no channel (driver 0, id 2^63), so that a reader that goes
+// from group to group always reaches the end. Before the first update all is zero.
+#pragma once
+
+#include <memory>
+
+#include "platform/linux/recorded/recording.h"
+#include "platform/system_log.h"
+#include "platform/user_client.h"
+
+namespace tavrel {
+
+/// `hub` is an entry of `recording`. The log must outlive the connection.
+std::unique_ptr<UserClient> connectToReportHub(std::shared_ptr<const Recording> recording,
+                                               const plist::Dictionary& hub, SystemLog& log);
+
+}  // namespace tavrel

@@ -1,0 +1,110 @@
+#include "platform/linux/service/socket_activation.h"
+
+#include <cerrno>
+#include <charconv>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <optional>
+#include <string>
+#include <sys/socket.h>
+#include <unistd.h>
+#include <vector>
+
+#include "base/limits.h"
+
+namespace tavrel {
+
+namespace {
+
+/// The first descriptor that is handed over, after the standard streams.
+constexpr int kFirstDescriptor = 3;
+
+std::optional<int> numberFromEnvironment(const char* variable) {
+  const char* text = std::getenv(variable);
+  if (!text) return std::nullopt;
+  const char* end = text + std::strlen(text);
+  int number = 0;
+  const auto [stop, error] = std::from_chars(text, end, number);
+  if (error != std::errc() || stop != end || number <= 0) return std::nullopt;
+  return number;
+}
+
+std::vector<std::string> namesFromEnvironment() {
+  std::vector<std::string> names;
+  const char* text = std::getenv("LISTEN_FDNAMES");
+  if (!text) return names;
+  std::string_view rest = text;
+  while (true) {
+    const std::size_t colon = rest.find(':');
+    names.emplace_back(rest.substr(0, colon));
+    if (colon == std::string_view::npos) return names;
+    rest.remove_prefix(colon + 1);
+  }
+}
+
+bool hasSocketOption(int descriptor, int option, int wanted) {
+  int value = 0;
+  socklen_t size = sizeof value;
+  return getsockopt(descriptor, SOL_SOCKET, option, &value, &size) == 0 && value == wanted;
+}
+
+bool isListeningPacketSocket(int descriptor) {
+  return hasSocketOption(descriptor, SO_DOMAIN, AF_UNIX) &&
+         hasSocketOption(descriptor, SO_TYPE, SOCK_SEQPACKET) &&
+         hasSocketOption(descriptor, SO_ACCEPTCONN, 1);
+}
+
+}  // namespace
+
+Descriptor activatedSocket(std::string_view name, SystemLog& log) {
+  const auto process = numberFromEnvironment("LISTEN_PID");
+  const auto count = numberFromEnvironment("LISTEN_FDS");
+  if (!process || *process != getpid() || !count) return {};
+  if (*count > limits::kActivationDescriptors) {
+    log.log(LogLevel::Error, "LISTEN_FDS hands over %d sockets, the limit is %d: none is used",
+            *count, limits::kActivationDescriptors);
+    return {};
+  }
+
+  const std::vector<std::string> names = namesFromEnvironment();
+  int chosen = -1;
+  int fitting = 0;
+  bool byName = false;
+  for (int i = 0; i < *count; ++i) {
+    const int descriptor = kFirstDescriptor + i;
+    fcntl(descriptor, F_SETFD, FD_CLOEXEC);
+    const auto index = static_cast<std::size_t>(i);
+    const bool isNamed = index < names.size() && names[index] == name;
+    if (!isListeningPacketSocket(descriptor)) {
+      if (isNamed) {
+        log.log(LogLevel::Error,
+                "descriptor %d of LISTEN_FDS, named %s, is no listening sequenced-packet socket: "
+                "use ListenSequentialPacket= and Accept=no in the socket unit",
+                descriptor, name);
+      }
+      continue;
+    }
+    ++fitting;
+    if (isNamed || !byName) chosen = descriptor;
+    byName |= isNamed;
+  }
+  if (chosen < 0 || (!byName && fitting > 1)) {
+    log.log(LogLevel::Error,
+            "none of the %d sockets of LISTEN_FDS can be told to be %s: set FileDescriptorName=%s "
+            "in the socket unit",
+            *count, name, name);
+    return {};
+  }
+  // A copy of its own, so that releasing a listener does not free the number for other files.
+  Descriptor socket(fcntl(chosen, F_DUPFD_CLOEXEC, kFirstDescriptor));
+  const int flags = socket ? fcntl(socket.get(), F_GETFL) : -1;
+  if (flags < 0 || fcntl(socket.get(), F_SETFL, flags | O_NONBLOCK) != 0) {
+    log.log(LogLevel::Error, "cannot use descriptor %d of LISTEN_FDS: %s", chosen,
+            std::strerror(errno));
+    return {};
+  }
+  return socket;
+}
+
+}  // namespace tavrel

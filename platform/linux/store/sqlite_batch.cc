@@ -1,0 +1,271 @@
+#include "platform/linux/store/sqlite_batch.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "base/keyed_hash.h"
+#include "base/limits.h"
+#include "platform/linux/store/sqlite_schema.h"
+
+namespace tavrel {
+namespace {
+
+// Rows of either kind held back before they are written, in bytes. They are written in the order of
+// their keys: the more there are, the fewer pages and chunks are written twice.
+constexpr std::size_t kPendingBytes = 8U << 20;
+
+// What a distribution costs beside its records while it waits.
+constexpr std::size_t kPendingSeriesBytes = 256;
+
+constexpr std::int64_t kValuesPerSeries = std::int64_t{kValuesPerChunk} << kChunkOrdinalBits;
+
+void checkKey(std::string_view key) {
+  if (key.size() <= limits::kStoreKeyBytes) return;
+  throw StoreFailure{StoreFault::Other, "a key of " + std::to_string(key.size()) +
+                                            " bytes is refused: the longest allowed has " +
+                                            std::to_string(limits::kStoreKeyBytes)};
+}
+
+[[noreturn]] void throwInconsistent() {
+  throw StoreFailure{StoreFault::Other,
+                     "the values of a distribution do not match their count: restore the file from "
+                     "a copy or move it away"};
+}
+
+}  // namespace
+
+struct SqliteBatch::Statements {
+  explicit Statements(const SqliteConnection& connection)
+      : setScalar(connection,
+                  "INSERT OR REPLACE INTO scalars (day, key, value) VALUES (?1, ?2, ?3)"),
+        getScalar(connection, "SELECT value FROM scalars WHERE day = ?1 AND key = ?2"),
+        getSeries(connection,
+                  "SELECT series, count FROM distributions WHERE day = ?1 AND key = ?2"),
+        setSeries(connection,
+                  "INSERT OR REPLACE INTO distributions (day, key, series, count) "
+                  "VALUES (?1, ?2, ?3, ?4)"),
+        getChunk(connection, "SELECT data FROM chunks WHERE chunk = ?1"),
+        setChunk(connection, "INSERT OR REPLACE INTO chunks (chunk, data) VALUES (?1, ?2)") {}
+
+  SqliteStatement setScalar;
+  SqliteStatement getScalar;
+  SqliteStatement getSeries;
+  SqliteStatement setSeries;
+  SqliteStatement getChunk;
+  SqliteStatement setChunk;
+};
+
+std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
+  // An odd factor keeps the days of one key apart.
+  return keyedHash(name.key) +
+         static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
+}
+
+SqliteBatch::SqliteBatch(SqliteConnection connection, std::string path)
+    : connection_(std::move(connection)), path_(std::move(path)) {
+  // A large import changes many pages.
+  connection_.execute("PRAGMA cache_size = -8192");
+  statements_ = std::make_unique<Statements>(connection_);
+}
+
+void SqliteBatch::begin() {
+  if (begun_) return;
+  connection_.execute("BEGIN IMMEDIATE");
+  begun_ = true;
+}
+
+// Closing the connection rolls an unfinished transaction back.
+SqliteBatch::~SqliteBatch() = default;
+
+Error SqliteBatch::describe(const StoreFailure& failure) const {
+  return Error{"statistics store " + path_ + ": " + failure.message};
+}
+
+void SqliteBatch::putScalar(std::int32_t day, std::string_view key, std::int64_t value) {
+  checkKey(key);
+  scalars_.push_back({day, static_cast<std::uint32_t>(key.size()), scalarKeys_.size(), value});
+  scalarKeys_ += key;
+  if (scalars_.size() * sizeof(PendingScalar) + scalarKeys_.size() >= kPendingBytes) writeScalars();
+}
+
+void SqliteBatch::writeScalars() {
+  if (scalars_.empty()) return;
+  begin();
+  const auto keyOf = [this](const PendingScalar& scalar) {
+    return std::string_view(scalarKeys_).substr(scalar.keyStart, scalar.keySize);
+  };
+  // Stable, so that of two values of one key the later one is written last.
+  std::stable_sort(scalars_.begin(), scalars_.end(),
+                   [&](const PendingScalar& a, const PendingScalar& b) {
+                     return a.day != b.day ? a.day < b.day : keyOf(a) < keyOf(b);
+                   });
+  for (const PendingScalar& scalar : scalars_) {
+    writeScalar(scalar.day, keyOf(scalar), scalar.value);
+  }
+  scalars_.clear();
+  scalarKeys_.clear();
+}
+
+void SqliteBatch::writeScalar(std::int32_t day, std::string_view key, std::int64_t value) {
+  SqliteStatement& statement = statements_->setScalar;
+  statement.bind(1, day);
+  statement.bind(2, key);
+  statement.bind(3, value);
+  statement.run();
+}
+
+Status SqliteBatch::setScalar(std::int32_t day, std::string_view key, std::int64_t value) {
+  try {
+    putScalar(day, key, value);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64_t amount) {
+  try {
+    checkKey(key);
+    writeScalars();
+    begin();
+    SqliteStatement& statement = statements_->getScalar;
+    statement.bind(1, day);
+    statement.bind(2, key);
+    const std::int64_t value = statement.step() ? statement.integer(0) : 0;
+    statement.reset();
+    std::int64_t sum = 0;
+    if (__builtin_add_overflow(value, amount, &sum)) {
+      return Error{"adding " + std::to_string(amount) + " to " + std::to_string(value) +
+                   " goes beyond 64 bits: set the value instead"};
+    }
+    writeScalar(day, key, sum);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
+                                std::uint32_t secondsInDayOffset, double value) {
+  try {
+    PendingSeries& series = pendingSeries({day, key});
+    appendDistributionRecord(series.records, {value, secondsInDayOffset});
+    pendingBytes_ += kDistributionRecordBytes;
+    if (pendingBytes_ >= kPendingBytes) writeDistributions();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+SqliteBatch::PendingSeries& SqliteBatch::pendingSeries(const SeriesName& name) {
+  if (last_ && last_->first == name) return *last_->second;
+  auto found = pending_.find(name);
+  if (found == pending_.end()) {
+    checkKey(name.key);
+    auto series = std::make_unique<PendingSeries>();
+    series->key = name.key;
+    const SeriesName owned{name.day, series->key};
+    found = pending_.emplace(owned, std::move(series)).first;
+    pendingBytes_ += kPendingSeriesBytes + name.key.size();
+  }
+  last_ = &*found;
+  return *found->second;
+}
+
+void SqliteBatch::writeDistributions() {
+  if (pending_.empty()) return;
+  begin();
+  // In the order in which a day is read, so that reading goes forward through the file.
+  std::vector<const PendingMap::value_type*> series;
+  series.reserve(pending_.size());
+  for (const auto& entry : pending_)
+    series.push_back(&entry);
+  std::sort(series.begin(), series.end(), [](const auto* a, const auto* b) {
+    return a->first.day != b->first.day ? a->first.day < b->first.day : a->first.key < b->first.key;
+  });
+  for (const auto* entry : series)
+    writeSeries(entry->first, entry->second->records);
+  last_ = nullptr;
+  pending_.clear();
+  pendingBytes_ = 0;
+}
+
+std::int64_t SqliteBatch::newSeries() {
+  // Every series has a chunk, so that the last chunk belongs to the latest series.
+  if (nextSeries_ < 0) {
+    nextSeries_ =
+        (connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") >> kChunkOrdinalBits) + 1;
+  }
+  if (nextSeries_ < 0 || nextSeries_ >= std::int64_t{1} << (62 - kChunkOrdinalBits)) {
+    throw StoreFailure{StoreFault::Other,
+                       "no number is left for a new distribution: move the file away"};
+  }
+  return nextSeries_++;
+}
+
+void SqliteBatch::writeSeries(const SeriesName& name, std::string_view records) {
+  Statements& sql = *statements_;
+  sql.getSeries.bind(1, name.day);
+  sql.getSeries.bind(2, name.key);
+  std::int64_t series = -1;
+  std::int64_t count = 0;
+  if (sql.getSeries.step()) {
+    series = sql.getSeries.integer(0);
+    count = sql.getSeries.integer(1);
+    if (series < 0 || count <= 0 || count > kValuesPerSeries) throwInconsistent();
+  }
+  sql.getSeries.reset();
+  if (series < 0) series = newSeries();
+
+  const auto added = static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
+  if (added > kValuesPerSeries - count) {
+    throw StoreFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
+                                              " values of one day and takes no more: use another "
+                                              "key"};
+  }
+
+  constexpr std::size_t kFullChunk = kValuesPerChunk * kDistributionRecordBytes;
+  std::int64_t chunk =
+      (series << kChunkOrdinalBits) + count / static_cast<std::int64_t>(kValuesPerChunk);
+  std::string filled;
+  if (const std::size_t begun = static_cast<std::size_t>(count) % kValuesPerChunk; begun != 0) {
+    sql.getChunk.bind(1, chunk);
+    if (sql.getChunk.step()) filled = sql.getChunk.bytes(0);
+    sql.getChunk.reset();
+    if (filled.size() != begun * kDistributionRecordBytes) throwInconsistent();
+  }
+  for (std::string_view rest = records; !rest.empty(); ++chunk) {
+    const std::size_t taken = std::min(rest.size(), kFullChunk - filled.size());
+    std::string_view data = rest.substr(0, taken);
+    if (!filled.empty()) data = filled.append(data);
+    sql.setChunk.bind(1, chunk);
+    sql.setChunk.bind(2, data);
+    sql.setChunk.run();
+    filled.clear();
+    rest.remove_prefix(taken);
+  }
+
+  sql.setSeries.bind(1, name.day);
+  sql.setSeries.bind(2, name.key);
+  sql.setSeries.bind(3, series);
+  sql.setSeries.bind(4, count + added);
+  sql.setSeries.run();
+}
+
+void SqliteBatch::finish() {
+  writeScalars();
+  writeDistributions();
+  if (begun_) connection_.execute("COMMIT");
+}
+
+Status SqliteBatch::commit() {
+  try {
+    finish();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+}  // namespace tavrel

@@ -1,0 +1,98 @@
+// Many changes to the statistics store in one transaction: all of them are kept, or none.
+//
+//   auto batch = store.beginBatch();
+//   if (!batch) return batch.error();
+//   (*batch)->setScalar(day, "com.example.starts", 3);
+//   (*batch)->commit();
+//
+// Rows wait in memory up to a bound. From the first that is written until the commit other writers
+// wait, so that a small batch holds them up only while it is committed. A batch that is not
+// committed leaves nothing. After a failure it can only be given up.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/store/sqlite_connection.h"
+#include "platform/statistics_store.h"
+
+namespace tavrel {
+
+class SqliteBatch {
+ public:
+  /// Throws `StoreFailure`. `path` is for messages.
+  SqliteBatch(SqliteConnection connection, std::string path);
+  ~SqliteBatch();
+  SqliteBatch(const SqliteBatch&) = delete;
+  SqliteBatch& operator=(const SqliteBatch&) = delete;
+
+  /// A key longer than `limits::kStoreKeyBytes` is refused, here and below.
+  Status setScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  /// Adds to the day's value, which is 0 when absent. A sum outside of 64 bits is refused and
+  /// leaves the value as it was.
+  Status addScalar(std::int32_t day, std::string_view key, std::int64_t amount);
+  Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
+                     double value);
+
+  /// Keeps the changes. The batch is spent.
+  Status commit();
+
+  /// As `setScalar` and `commit`, for use inside the store: they throw `StoreFailure`.
+  void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  void finish();
+
+ private:
+  struct Statements;
+
+  // A distribution of a day; the key is borrowed.
+  struct SeriesName {
+    std::int32_t day = 0;
+    std::string_view key;
+    bool operator==(const SeriesName&) const = default;
+  };
+  struct HashName {
+    std::size_t operator()(const SeriesName& name) const;
+  };
+  // Values that wait to be written, as chunk records. Names in the map borrow `key`.
+  struct PendingSeries {
+    std::string key;
+    std::string records;
+  };
+  // A scalar that waits to be written; its key stands in `scalarKeys_`.
+  struct PendingScalar {
+    std::int32_t day;
+    std::uint32_t keySize;
+    std::size_t keyStart;
+    std::int64_t value;
+  };
+  using PendingMap = std::unordered_map<SeriesName, std::unique_ptr<PendingSeries>, HashName>;
+
+  void begin();
+  PendingSeries& pendingSeries(const SeriesName& name);
+  void writeScalars();
+  void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  void writeDistributions();
+  void writeSeries(const SeriesName& name, std::string_view records);
+  std::int64_t newSeries();
+  Error describe(const StoreFailure& failure) const;
+
+  SqliteConnection connection_;
+  std::string path_;
+  std::unique_ptr<Statements> statements_;
+  bool begun_ = false;
+  std::vector<PendingScalar> scalars_;
+  std::string scalarKeys_;
+  PendingMap pending_;
+  std::size_t pendingBytes_ = 0;  // of `pending_`
+  // Values of one distribution often follow each other.
+  const PendingMap::value_type* last_ = nullptr;
+  std::int64_t nextSeries_ = -1;  // not looked up yet when negative
+};
+
+}  // namespace tavrel

@@ -1,0 +1,262 @@
+#include "platform/linux/store/sqlite_connection.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <sqlite3.h>
+#include <thread>
+#include <unistd.h>
+#include <utility>
+
+namespace tavrel {
+namespace {
+
+constexpr const char* kFreeSpace = "free some space in its file system";
+
+struct Explanation {
+  StoreFault fault;
+  const char* advice;
+};
+
+Explanation explain(int code) {
+  switch (code & 0xFF) {
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+      return {StoreFault::Damaged, "the file has to be set aside"};
+    case SQLITE_BUSY:
+    case SQLITE_LOCKED:
+    case SQLITE_PROTOCOL:
+      return {StoreFault::Busy, "try again when the process that holds it has finished"};
+    case SQLITE_CANTOPEN:
+    case SQLITE_READONLY:
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+      return {StoreFault::Refused, "check owner and permissions of the file and its folder"};
+    case SQLITE_ERROR:
+      return {StoreFault::Foreign, "the tables are not this program's; move the file away"};
+    case SQLITE_FULL:
+      return {StoreFault::Device, kFreeSpace};
+    case SQLITE_IOERR:
+      return {StoreFault::Device, "check the file system that holds it"};
+    default:
+      return {StoreFault::Other, "check the file system that holds it"};
+  }
+}
+
+// Why the system does not let the database be written; 0 when it does or when there is none.
+int obstacleToWriting(sqlite3* connection) {
+  const char* const name = sqlite3_db_filename(connection, "main");
+  const std::string path = name ? name : "";
+  if (path.empty()) return 0;
+  const std::string folder = path.substr(0, path.rfind('/') + 1);
+  for (const std::string& place : {path, folder}) {
+    if (!place.empty() && faccessat(AT_FDCWD, place.c_str(), W_OK, AT_EACCESS) != 0) return errno;
+  }
+  return 0;
+}
+
+// The system's code behind a failure, 0 when there is none. SQLite tries again for reading what it
+// may not open for writing, and then tells the code of the second attempt: the first one's is asked
+// for anew.
+int systemCodeOf(sqlite3* connection, int code) {
+  switch (code & 0xFF) {
+    case SQLITE_IOERR:
+      return sqlite3_system_errno(connection);
+    case SQLITE_CANTOPEN:
+      if (const int obstacle = obstacleToWriting(connection)) return obstacle;
+      return sqlite3_system_errno(connection);
+    case SQLITE_READONLY:
+      return obstacleToWriting(connection);
+    default:
+      return 0;
+  }
+}
+
+[[noreturn]] void throwFailure(sqlite3* connection, int code) {
+  auto [fault, advice] = explain(code);
+  std::string message = connection ? sqlite3_errmsg(connection) : sqlite3_errstr(code);
+  if (const int systemCode = connection ? systemCodeOf(connection, code) : 0) {
+    message += " (";
+    message += std::strerror(systemCode);
+    message += ')';
+    advice = adviceFor(systemCode, advice);
+    if (advice == kFreeSpace) fault = StoreFault::Device;
+  }
+  throw StoreFailure{fault, message + ": " + advice};
+}
+
+int waitForLock(void* busy, int) {
+  return static_cast<BusyBudget*>(busy)->wait();
+}
+
+// SQLite's URI form is the only way to ask for an immutable file; in it "%", "?" and "#" have a
+// meaning.
+std::string immutableUri(const std::string& path) {
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  std::string uri = "file:";
+  for (const char character : path) {
+    if (character == '%' || character == '?' || character == '#') {
+      const auto bits = static_cast<unsigned char>(character);
+      uri += '%';
+      uri += kDigits[bits >> 4];
+      uri += kDigits[bits & 0xF];
+    } else {
+      uri += character;
+    }
+  }
+  return uri + "?immutable=1";
+}
+
+}  // namespace
+
+const char* adviceFor(int systemCode, const char* otherwise) {
+  switch (systemCode) {
+    case ENOSPC:
+    case EDQUOT:
+      return kFreeSpace;
+    case EROFS:
+      return "mount its file system for writing";
+    default:
+      return otherwise;
+  }
+}
+
+bool BusyBudget::wait() {
+  using Clock = std::chrono::steady_clock;
+  constexpr Clock::duration kMoment = std::chrono::milliseconds(5);
+  if (left_ <= Clock::duration::zero()) return false;
+  const auto begin = Clock::now();
+  std::this_thread::sleep_for(std::min(kMoment, left_));
+  left_ -= Clock::now() - begin;
+  return true;
+}
+
+SqliteConnection::SqliteConnection(const std::string& path, Access access,
+                                   std::shared_ptr<BusyBudget> busy)
+    : busy_(std::move(busy)) {
+  int flags = SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
+  std::string name = path;
+  switch (access) {
+    case Access::Create:
+      flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
+      break;
+    case Access::Read:
+      // A user who may write takes part in the log as a writer does, and so leaves none behind.
+      // SQLite opens a write-protected file for reading.
+      flags |= SQLITE_OPEN_READWRITE;
+      break;
+    case Access::Immutable:
+      flags |= SQLITE_OPEN_READONLY | SQLITE_OPEN_URI;
+      name = immutableUri(path);
+      break;
+  }
+  const int code = sqlite3_open_v2(name.c_str(), &handle_, flags, nullptr);
+  try {
+    if (code != SQLITE_OK) throwFailure(handle_, code);
+    sqlite3_busy_handler(handle_, waitForLock, busy_.get());
+    // The file may come from anywhere: nothing that its schema says is to run.
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
+    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
+    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512");
+  } catch (...) {
+    sqlite3_close_v2(handle_);
+    throw;
+  }
+}
+
+SqliteConnection::~SqliteConnection() {
+  sqlite3_close_v2(handle_);
+}
+
+SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
+    : handle_(std::exchange(other.handle_, nullptr)), busy_(std::move(other.busy_)) {}
+
+SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
+  std::swap(handle_, other.handle_);
+  std::swap(busy_, other.busy_);
+  return *this;
+}
+
+void SqliteConnection::execute(const char* sql) {
+  const int code = sqlite3_exec(handle_, sql, nullptr, nullptr, nullptr);
+  if (code != SQLITE_OK) throwFailure(handle_, code);
+}
+
+std::int64_t SqliteConnection::integer(std::string_view sql) {
+  SqliteStatement statement(*this, sql);
+  return statement.step() ? statement.integer(0) : 0;
+}
+
+bool SqliteConnection::checkpoint() {
+  const int code =
+      sqlite3_wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  if (code == SQLITE_OK) return true;
+  if ((code & 0xFF) == SQLITE_BUSY || (code & 0xFF) == SQLITE_LOCKED) return false;
+  throwFailure(handle_, code);
+}
+
+SqliteStatement::SqliteStatement(const SqliteConnection& connection, std::string_view sql) {
+  const int code = sqlite3_prepare_v2(connection.handle(), sql.data(), static_cast<int>(sql.size()),
+                                      &handle_, nullptr);
+  if (code != SQLITE_OK) throwFailure(connection.handle(), code);
+}
+
+SqliteStatement::~SqliteStatement() {
+  sqlite3_finalize(handle_);
+}
+
+void SqliteStatement::check(int code) const {
+  if (code != SQLITE_OK) throwFailure(sqlite3_db_handle(handle_), code);
+}
+
+void SqliteStatement::bind(int index, std::int64_t value) {
+  check(sqlite3_bind_int64(handle_, index, value));
+}
+
+void SqliteStatement::bind(int index, std::string_view bytes) {
+  // A null address would bind NULL in the place of a blob of no bytes.
+  const char* const data = bytes.data() ? bytes.data() : "";
+  check(sqlite3_bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
+}
+
+void SqliteStatement::bindNull(int index) {
+  check(sqlite3_bind_null(handle_, index));
+}
+
+bool SqliteStatement::step() {
+  const int code = sqlite3_step(handle_);
+  if (code == SQLITE_ROW) return true;
+  if (code == SQLITE_DONE) return false;
+  throwFailure(sqlite3_db_handle(handle_), code);
+}
+
+void SqliteStatement::reset() {
+  // The code of a reset repeats the failure of the step before, which has been told.
+  sqlite3_reset(handle_);
+}
+
+void SqliteStatement::run() {
+  while (step()) {
+  }
+  reset();
+}
+
+bool SqliteStatement::isNull(int column) const {
+  return sqlite3_column_type(handle_, column) == SQLITE_NULL;
+}
+
+std::int64_t SqliteStatement::integer(int column) const {
+  return sqlite3_column_int64(handle_, column);
+}
+
+std::string_view SqliteStatement::bytes(int column) const {
+  const void* const data = sqlite3_column_blob(handle_, column);
+  const int size = sqlite3_column_bytes(handle_, column);
+  return data ? std::string_view(static_cast<const char*>(data), static_cast<std::size_t>(size))
+              : std::string_view();
+}
+
+}  // namespace tavrel

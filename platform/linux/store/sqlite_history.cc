@@ -1,0 +1,274 @@
+#include "platform/linux/store/sqlite_history.h"
+
+#include <algorithm>
+#include <limits>
+#include <string>
+#include <utility>
+
+#include "base/text.h"
+
+namespace tavrel {
+namespace {
+
+// The first key above every key that begins with `prefix`; nothing when there is none.
+std::optional<std::string> keyAbove(std::string_view prefix) {
+  std::string above(prefix);
+  while (!above.empty() && above.back() == '\xFF')
+    above.pop_back();
+  if (above.empty()) return std::nullopt;
+  above.back() = static_cast<char>(static_cast<unsigned char>(above.back()) + 1);
+  return above;
+}
+
+StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
+  // Of a long key its beginning says enough.
+  constexpr std::size_t kShownBytes = 200;
+  std::string message = "distribution ";
+  appendQuoted(message, key.substr(0, kShownBytes));
+  message += " of day " + std::to_string(day) + ": " + failure.message;
+  return {failure.fault, std::move(message)};
+}
+
+class ChunkEnumerator : public BHHistoryDistributionEnumerator {
+ public:
+  ChunkEnumerator(SqliteStatement& chunks, std::int64_t series, std::int64_t count)
+      : chunks_(chunks), series_(series), count_(count) {}
+  ~ChunkEnumerator() override {
+    if (state_ == State::Reading) chunks_.reset();
+  }
+  ChunkEnumerator(const ChunkEnumerator&) = delete;
+  ChunkEnumerator& operator=(const ChunkEnumerator&) = delete;
+
+  const std::optional<StoreFailure>& failure() const { return failure_; }
+
+ private:
+  enum class State : std::uint8_t { Unread, Reading, Ended };
+
+  std::string_view nextBlock() override {
+    try {
+      if (state_ == State::Unread) begin();
+      if (state_ == State::Reading && chunks_.step()) {
+        const std::string_view records = chunks_.bytes(0);
+        if (records.empty() || records.size() % kDistributionRecordBytes != 0 ||
+            records.size() > kValuesPerChunk * kDistributionRecordBytes) {
+          refuse("its values are not in the form that this program writes");
+        }
+        read_ += static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
+        if (read_ <= count_) return records;
+      }
+      if (state_ == State::Reading && read_ != count_) {
+        refuse("it does not hold the " + std::to_string(count_) + " values that it counts");
+      }
+    } catch (const StoreFailure& failure) {
+      failure_ = failure;
+      fail();
+    }
+    if (state_ == State::Reading) chunks_.reset();
+    state_ = State::Ended;
+    return {};
+  }
+
+  [[noreturn]] static void refuse(const std::string& reason) {
+    throw StoreFailure{StoreFault::Other,
+                       reason + ": restore the file from a copy or move it away"};
+  }
+
+  void begin() {
+    constexpr std::int64_t kSeriesEnd = std::int64_t{1} << (62 - kChunkOrdinalBits);
+    if (series_ < 0 || series_ >= kSeriesEnd) {
+      state_ = State::Ended;
+      refuse("it refers to values that cannot exist");
+    }
+    chunks_.bind(1, series_ << kChunkOrdinalBits);
+    chunks_.bind(2, (series_ + 1) << kChunkOrdinalBits);
+    state_ = State::Reading;
+  }
+
+  SqliteStatement& chunks_;
+  std::int64_t series_;
+  std::int64_t count_;
+  std::int64_t read_ = 0;
+  State state_ = State::Unread;
+  std::optional<StoreFailure> failure_;
+};
+
+}  // namespace
+
+struct SqliteHistory::Selection {
+  std::string_view prefix;
+  // Both included.
+  std::int64_t firstDay;
+  std::int64_t lastDay;
+  Order order;
+  std::optional<std::string> keyAbovePrefix = keyAbove(prefix);
+
+  /// The days above `minDay` and not above `maxDay`.
+  static Selection between(std::string_view prefix, std::int64_t minDay, std::int64_t maxDay) {
+    constexpr std::int64_t kFirst = std::numeric_limits<std::int32_t>::min();
+    constexpr std::int64_t kLast = std::numeric_limits<std::int32_t>::max();
+    return {prefix, std::clamp(minDay, kFirst - 1, kLast) + 1, std::min(maxDay, kLast),
+            Order::KeyThenDay};
+  }
+
+  bool isEmpty() const { return firstDay > lastDay; }
+
+  /// The query that gives the selection in its order.
+  std::string_view choose(std::string_view ofDay, std::string_view byKey,
+                          std::string_view byDay) const {
+    if (firstDay == lastDay) return ofDay;
+    return order == Order::KeyThenDay ? byKey : byDay;
+  }
+
+  /// Binds the parameters of that query. The selection must outlive the statement's run.
+  void bind(SqliteStatement& statement) const {
+    statement.bind(1, firstDay);
+    if (firstDay == lastDay) return statement.bind(2, prefix);
+    statement.bind(2, lastDay);
+    statement.bind(3, prefix);
+    if (keyAbovePrefix) {
+      statement.bind(4, std::string_view(*keyAbovePrefix));
+    } else {
+      statement.bindNull(4);
+    }
+  }
+};
+
+SqliteHistory::SqliteHistory(StoreSite site, std::optional<FileIdentity> identity,
+                             std::optional<ReadableStore> store)
+    : site_(std::move(site)), identity_(identity), store_(std::move(store)) {}
+
+void SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                                        std::int64_t maxDaysSince1970,
+                                        const ScalarRowHandler& rowHandler) {
+  try {
+    readScalars(Selection::between(prefix, minDaysSince1970, maxDaysSince1970), rowHandler);
+  } catch (const StoreFailure& failure) {
+    report(failure);
+  }
+}
+
+void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
+                                              std::int64_t minDaysSince1970,
+                                              std::int64_t maxDaysSince1970,
+                                              const DistributionRowHandler& rowHandler) {
+  try {
+    readDistributions(
+        Selection::between(prefix, minDaysSince1970, maxDaysSince1970),
+        [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
+                      BHHistoryDistributionEnumerator& values,
+                      bool& stop) { rowHandler(key, day, values, stop); },
+        [this](const StoreFailure& failure) { site_.tell(failure); });
+  } catch (const StoreFailure& failure) {
+    report(failure);
+  }
+}
+
+Status SqliteHistory::walkScalars(std::string_view prefix, std::int32_t firstDay,
+                                  std::int32_t lastDay, const ScalarRowHandler& rowHandler) {
+  try {
+    readScalars({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler);
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+  return Done{};
+}
+
+Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t firstDay,
+                                        std::int32_t lastDay, const CountedRowHandler& rowHandler) {
+  std::optional<StoreFailure> first;
+  std::int64_t others = 0;
+  try {
+    readDistributions({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler,
+                      [&](const StoreFailure& failure) {
+                        if (first) return void(++others);
+                        first = failure;
+                      });
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+  if (!first) return Done{};
+  std::string message = site_.describe(*first);
+  if (others > 0) {
+    message += "; " + std::to_string(others) + " more could not be read whole";
+  }
+  return Error{std::move(message)};
+}
+
+Expected<SqliteHistory::Holdings> SqliteHistory::holdings() {
+  Holdings holdings;
+  if (!store_) return holdings;
+  try {
+    // One look-up for each day held, in the place of a walk over all rows.
+    SqliteStatement scalars(store_->connection, "SELECT min(day) FROM scalars WHERE day >= ?1");
+    SqliteStatement distributions(store_->connection,
+                                  "SELECT min(day) FROM distributions WHERE day >= ?1");
+    constexpr std::int64_t kNone = std::numeric_limits<std::int64_t>::max();
+    const auto firstFrom = [](SqliteStatement& statement, std::int64_t day) {
+      statement.bind(1, day);
+      const std::int64_t found =
+          statement.step() && !statement.isNull(0) ? statement.integer(0) : kNone;
+      statement.reset();
+      return found;
+    };
+    std::int64_t day = std::numeric_limits<std::int32_t>::min();
+    while (true) {
+      day = std::min(firstFrom(scalars, day), firstFrom(distributions, day));
+      if (day > std::numeric_limits<std::int32_t>::max()) break;
+      if (holdings.days++ == 0) holdings.firstDay = static_cast<std::int32_t>(day);
+      holdings.lastDay = static_cast<std::int32_t>(day++);
+    }
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+  return holdings;
+}
+
+void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandler& rowHandler) {
+  if (!store_ || selection.isEmpty()) return;
+  SqliteStatement rows(store_->connection,
+                       selection.choose(store_sql::kScalarsOfDay, store_sql::kScalarsByKey,
+                                        store_sql::kScalarsByDay));
+  selection.bind(rows);
+  bool stop = false;
+  while (!stop && rows.step()) {
+    const std::string_view key = rows.bytes(0);
+    // The query for one day has no upper bound: the first key without the prefix is behind all
+    // that have it.
+    if (!key.starts_with(selection.prefix)) break;
+    rowHandler(key, static_cast<std::int32_t>(rows.integer(1)), rows.integer(2), stop);
+  }
+}
+
+void SqliteHistory::readDistributions(const Selection& selection,
+                                      const CountedRowHandler& rowHandler,
+                                      const FailureHandler& tell) {
+  if (!store_ || selection.isEmpty()) return;
+  SqliteStatement rows(store_->connection, selection.choose(store_sql::kDistributionsOfDay,
+                                                            store_sql::kDistributionsByKey,
+                                                            store_sql::kDistributionsByDay));
+  SqliteStatement chunks(store_->connection, store_sql::kChunks);
+  selection.bind(rows);
+  bool stop = false;
+  while (!stop && rows.step()) {
+    const std::string_view key = rows.bytes(0);
+    if (!key.starts_with(selection.prefix)) break;
+    const auto day = static_cast<std::int32_t>(rows.integer(1));
+    const std::int64_t count = rows.integer(3);
+    ChunkEnumerator values(chunks, rows.integer(2), count);
+    rowHandler(key, day, count, values, stop);
+    if (!values.failure()) continue;
+    if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();
+    tell(inDistribution(key, day, *values.failure()));
+  }
+}
+
+void SqliteHistory::report(const StoreFailure& failure) {
+  std::optional<StoreFailure> untold = failure;
+  if (failure.fault == StoreFault::Damaged && !store_->immutable) {
+    store_.reset();
+    untold = site_.setAside(identity_, failure);
+  }
+  if (untold) site_.tell(*untold);
+}
+
+}  // namespace tavrel

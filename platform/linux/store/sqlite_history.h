@@ -1,0 +1,76 @@
+// The reader of the statistics store.
+//
+// Each query sees the store as it was when the query began, whatever others write meanwhile. The
+// values of a distribution are read only when its enumerator is asked, one chunk at a time.
+//
+//   auto history = store.openHistory();
+//   if (history) (*history)->walkScalars("com.example.", first, last, handler);
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <string_view>
+
+#include "base/expected.h"
+#include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_site.h"
+#include "platform/statistics_store.h"
+
+namespace tavrel {
+
+class SqliteHistory : public BHHistory {
+ public:
+  /// A history without a store has no rows. `identity` is the store's file as it was before it was
+  /// opened. The services behind `site` must outlive the history.
+  SqliteHistory(StoreSite site, std::optional<FileIdentity> identity,
+                std::optional<ReadableStore> store);
+
+  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                           std::int64_t maxDaysSince1970,
+                           const ScalarRowHandler& rowHandler) override;
+  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                                 std::int64_t maxDaysSince1970,
+                                 const DistributionRowHandler& rowHandler) override;
+
+  /// False when there is no store yet, or none that could be read.
+  bool hasStore() const { return store_.has_value(); }
+
+  /// `count` is the number of values, known without reading them.
+  using CountedRowHandler =
+      std::function<void(std::string_view key, std::int32_t day, std::int64_t count,
+                         BHHistoryDistributionEnumerator& values, bool& stop)>;
+
+  /// Rows whose key begins with `prefix`, from `firstDay` to `lastDay`, both included, ordered by
+  /// day and then by key. On failure the rows before it have been delivered. A distribution whose
+  /// values could not all be read fails the walk at its end, after the rows behind it.
+  Status walkScalars(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
+                     const ScalarRowHandler& rowHandler);
+  Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
+                           const CountedRowHandler& rowHandler);
+
+  struct Holdings {
+    std::int64_t days = 0;
+    /// Meaningless when there are no days.
+    std::int32_t firstDay = 0;
+    std::int32_t lastDay = 0;
+  };
+  /// The days of which anything is held.
+  Expected<Holdings> holdings();
+
+ private:
+  enum class Order : std::uint8_t { KeyThenDay, DayThenKey };
+  struct Selection;
+  void readScalars(const Selection& selection, const ScalarRowHandler& rowHandler);
+  /// Damage that SQLite finds ends the walk; of other rows with missing values `tell` is told.
+  using FailureHandler = std::function<void(const StoreFailure& failure)>;
+  void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
+                         const FailureHandler& tell);
+  void report(const StoreFailure& failure);
+
+  StoreSite site_;
+  std::optional<FileIdentity> identity_;
+  std::optional<ReadableStore> store_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,141 @@
+#include "platform/linux/store/sqlite_schema.h"
+
+#include <cerrno>
+#include <cstring>
+#include <sqlite3.h>
+#include <sys/stat.h>
+
+#include "platform/linux/store/sqlite_site.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::int64_t kSchemaVersion = 1;
+
+// Of a new store. Values are read as fast as the system hands out their pages, and that is twice as
+// fast by 64 KiB as by SQLite's 4 KiB. Commits, which write whole pages, are few.
+constexpr const char* kPageSize = "PRAGMA page_size = 65536";
+
+// The log is moved into the database when it is longer than 4 MiB, as with pages of 4 KiB.
+constexpr const char* kAutomaticCheckpoint = "PRAGMA wal_autocheckpoint = 64";
+
+// Keys are blobs: they are compared byte by byte and may hold any byte.
+constexpr const char* kSchema = R"(
+CREATE TABLE scalars (
+  day INTEGER NOT NULL,
+  key BLOB NOT NULL,
+  value INTEGER NOT NULL,
+  PRIMARY KEY (day, key)
+) STRICT, WITHOUT ROWID;
+CREATE TABLE distributions (
+  day INTEGER NOT NULL,
+  key BLOB NOT NULL,
+  series INTEGER NOT NULL,
+  count INTEGER NOT NULL,
+  PRIMARY KEY (day, key)
+) STRICT, WITHOUT ROWID;
+CREATE TABLE chunks (
+  chunk INTEGER PRIMARY KEY,
+  data BLOB NOT NULL
+) STRICT;
+PRAGMA user_version = 1;
+)";
+
+std::int64_t schemaVersion(SqliteConnection& connection) {
+  return connection.integer("PRAGMA user_version");
+}
+
+bool hasTables(SqliteConnection& connection) {
+  return connection.integer("SELECT count(*) FROM sqlite_schema") != 0;
+}
+
+[[noreturn]] void refuseSchema(std::int64_t version) {
+  if (version == 0) {
+    throw StoreFailure{StoreFault::Foreign,
+                       "holds the tables of another program and is left alone: move it away"};
+  }
+  throw StoreFailure{StoreFault::Foreign,
+                     "has schema version " + std::to_string(version) +
+                         ", which this program does not know (it knows 1), and is left alone: "
+                         "update tavrel, or move the file away"};
+}
+
+// Opening a pipe or a device in the store's place could block for ever.
+bool checkIsFile(const std::string& path) {
+  struct stat status;
+  if (stat(path.c_str(), &status) != 0) {
+    if (errno == ENOENT || errno == ENOTDIR) return false;
+    throw StoreFailure{StoreFault::Refused, std::string("cannot be read: ") + std::strerror(errno) +
+                                                ": check owner and permissions of its folder"};
+  }
+  if (!S_ISREG(status.st_mode)) {
+    throw StoreFailure{StoreFault::Foreign, "is not a regular file: move it away"};
+  }
+  return true;
+}
+
+bool hasLog(const std::string& path) {
+  struct stat status;
+  return stat((path + "-wal").c_str(), &status) == 0 && status.st_size != 0;
+}
+
+// True when the store has tables to read.
+bool isReadable(SqliteConnection& connection) {
+  const std::int64_t version = schemaVersion(connection);
+  if (version == kSchemaVersion) return true;
+  if (version != 0 || hasTables(connection)) refuseSchema(version);
+  return false;
+}
+
+}  // namespace
+
+SqliteConnection openStoreForWriting(const std::string& path,
+                                     const std::shared_ptr<BusyBudget>& busy) {
+  checkIsFile(path);
+  SqliteConnection connection(path, SqliteConnection::Access::Create, busy);
+  std::int64_t version = schemaVersion(connection);
+  if (version == 0) {
+    const StoreFolderLock lock(path, *busy);
+    version = schemaVersion(connection);
+    if (version == 0) {
+      if (hasTables(connection)) refuseSchema(version);
+      connection.execute(kPageSize);
+      connection.execute("PRAGMA journal_mode = WAL; BEGIN IMMEDIATE");
+      connection.execute(kSchema);
+      connection.execute("COMMIT");
+      version = schemaVersion(connection);
+    }
+  }
+  if (version != kSchemaVersion) refuseSchema(version);
+  // Commits are few and hold a whole run's values, so each is flushed: what was said to be kept is
+  // kept across a power cut too.
+  connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
+  connection.execute(kAutomaticCheckpoint);
+  return connection;
+}
+
+std::optional<ReadableStore> openStoreForReading(const std::string& path,
+                                                 const std::shared_ptr<BusyBudget>& busy) {
+  if (!checkIsFile(path)) return std::nullopt;
+  try {
+    SqliteConnection connection(path, SqliteConnection::Access::Read, busy);
+    if (!isReadable(connection)) return std::nullopt;
+    return ReadableStore{std::move(connection), false};
+  } catch (const StoreFailure& failure) {
+    // Taking part in the log needs files of its own beside the store, and room for them.
+    if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
+    if (hasLog(path)) {
+      if (failure.fault == StoreFault::Device) throw;
+      throw StoreFailure{failure.fault,
+                         failure.message +
+                             "; its write-ahead log is only readable where the folder can be "
+                             "written: have a user who may write run 'tavrelctl stat list' once"};
+    }
+  }
+  // Without a log nobody is writing, and all there is stands in the file itself.
+  SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
+  if (!isReadable(connection)) return std::nullopt;
+  return ReadableStore{std::move(connection), true};
+}
+
+}  // namespace tavrel

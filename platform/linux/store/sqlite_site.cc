@@ -1,0 +1,105 @@
+#include "platform/linux/store/sqlite_site.h"
+
+#include <cerrno>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/file.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "base/arithmetic.h"
+#include "platform/linux/files/stamp.h"
+#include "platform/statistics_store.h"
+
+namespace tavrel {
+namespace {
+
+std::string folderOf(const std::string& path) {
+  return path.substr(0, path.rfind('/') + 1);
+}
+
+// A name of which neither the file nor its log files exist yet.
+std::string freeName(const std::string& wanted) {
+  std::string name = wanted;
+  for (int attempt = 1; FileIdentity::of(name) || FileIdentity::of(name + "-wal"); ++attempt) {
+    name = wanted + "." + std::to_string(attempt);
+  }
+  return name;
+}
+
+bool moveFile(const std::string& from, const std::string& to) {
+  return rename(from.c_str(), to.c_str()) == 0 || errno == ENOENT;
+}
+
+}  // namespace
+
+std::optional<FileIdentity> FileIdentity::of(const std::string& path) {
+  struct stat status;
+  if (lstat(path.c_str(), &status) != 0) return std::nullopt;
+  return FileIdentity{status.st_dev, status.st_ino};
+}
+
+StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy) {
+  const std::string folder = folderOf(storePath);
+  descriptor_ = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
+  if (descriptor_ < 0) {
+    throw StoreFailure{StoreFault::Refused, std::string("its folder cannot be opened: ") +
+                                                std::strerror(errno) +
+                                                ": check owner and permissions of the folder"};
+  }
+  while (flock(descriptor_, LOCK_EX | LOCK_NB) != 0) {
+    const int code = errno;
+    if ((code != EWOULDBLOCK && code != EINTR) || !busy.wait()) {
+      close(descriptor_);
+      throw StoreFailure{StoreFault::Busy,
+                         std::string("its folder cannot be locked: ") + std::strerror(code) +
+                             ": try again when the process that holds it has finished"};
+    }
+  }
+}
+
+StoreFolderLock::~StoreFolderLock() {
+  close(descriptor_);
+}
+
+std::string StoreSite::describe(const StoreFailure& failure) const {
+  return "statistics store " + path + ": " + failure.message;
+}
+
+void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) const {
+  const bool passes = failure.fault == StoreFault::Busy || failure.fault == StoreFault::Other;
+  if (!passes && !told->insert(failure.message).second) return;
+  log.write(LogLevel::Error, describe(failure).append(consequence));
+}
+
+std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
+                                                const StoreFailure& failure) const {
+  if (leavesDamaged) {
+    return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
+  }
+  try {
+    const StoreFolderLock lock(path, *busy);
+    if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
+    const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
+    // The log goes first: were the process killed in between, the file would be found damaged once
+    // more, while a log without its file would be taken for a new store's.
+    if (!moveFile(path + "-wal", name + "-wal") || !moveFile(path + "-shm", name + "-shm") ||
+        !moveFile(path, name)) {
+      throw StoreFailure{StoreFault::Refused, std::string("it cannot be set aside: ") +
+                                                  std::strerror(errno) +
+                                                  ": run as the owner of its folder"};
+    }
+    log.write(LogLevel::Error, describe(failure) + "; it is now " + name +
+                                   " and a new store is begun: inspect or remove that file");
+  } catch (const StoreFailure& obstacle) {
+    return StoreFailure{failure.fault, failure.message + "; " + obstacle.message};
+  }
+  const std::int64_t count =
+      preferences.ZTXPreferencesGetIntegerValue(kStoreCorruptionsKey, kStoreCorruptionsDomain);
+  preferences.ZTXPreferencesSetValue(kStoreCorruptionsKey, plist::Number(wrappingAdd(count, 1)),
+                                     kStoreCorruptionsDomain);
+  preferences.ZTXPreferencesSynchronize(kStoreCorruptionsDomain);
+  return std::nullopt;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,68 @@
+// Where the statistics store lies, and what is done when its file turns out to be unusable.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <optional>
+#include <set>
+#include <string>
+#include <string_view>
+
+#include "base/expected.h"
+#include "platform/clock.h"
+#include "platform/linux/store/sqlite_connection.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+/// Which file stands at a path.
+struct FileIdentity {
+  std::uint64_t device = 0;
+  std::uint64_t inode = 0;
+  bool operator==(const FileIdentity&) const = default;
+
+  /// The file at `path` now; nothing when there is none.
+  static std::optional<FileIdentity> of(const std::string& path);
+};
+
+/// Held while the store's file is created or set aside, so that of several processes one does it.
+/// The lock is on the store's folder and goes with the process.
+class StoreFolderLock {
+ public:
+  /// Throws `StoreFailure` when the lock is not to be had in time.
+  StoreFolderLock(const std::string& storePath, BusyBudget& busy);
+  ~StoreFolderLock();
+  StoreFolderLock(const StoreFolderLock&) = delete;
+  StoreFolderLock& operator=(const StoreFolderLock&) = delete;
+
+ private:
+  int descriptor_;
+};
+
+/// The store's path and the services that its failures are told to. The services must outlive it.
+struct StoreSite {
+  std::string path;
+  std::shared_ptr<BusyBudget> busy;
+  Clock& clock;
+  Preferences& preferences;
+  SystemLog& log;
+  /// A damaged store stays where it is: for readers that change nothing.
+  bool leavesDamaged = false;
+  /// Failures that only somebody's intervention ends: they are told once.
+  std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
+
+  /// "statistics store PATH: MESSAGE".
+  std::string describe(const StoreFailure& failure) const;
+
+  /// One line in the system log, with `consequence` at its end.
+  void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
+
+  /// Moves a damaged store with its log files to names of their own, counts it and says so.
+  /// `damaged` is the file that was found damaged: nothing is done when another process has
+  /// already replaced it. Yields the failure with what stood in the way when it could not be moved.
+  std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
+                                       const StoreFailure& failure) const;
+};
+
+}  // namespace tavrel

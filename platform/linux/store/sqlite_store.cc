@@ -1,0 +1,148 @@
+#include "platform/linux/store/sqlite_store.h"
+
+#include <algorithm>
+#include <cmath>
+#include <filesystem>
+#include <limits>
+#include <optional>
+#include <system_error>
+
+#include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "platform/guarded.h"
+#include "platform/linux/store/sqlite_schema.h"
+
+namespace tavrel {
+
+SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences,
+                         SystemLog& log, int busyMilliseconds, bool leavesDamaged)
+    : site_{root.path(kStorePath),
+            std::make_shared<BusyBudget>(busyMilliseconds),
+            clock,
+            preferences,
+            log,
+            leavesDamaged} {}
+
+SqliteStore::~SqliteStore() {
+  runGuarded(site_.log, "commit the last statistics", [this] { commit(); });
+}
+
+std::int32_t SqliteStore::BHDaysSince1970() {
+  constexpr std::int64_t kLast = std::numeric_limits<std::int32_t>::max();
+  constexpr std::int64_t kFirst = std::numeric_limits<std::int32_t>::min();
+  const double days =
+      std::floor(site_.clock.now().secondsSince1970() / static_cast<double>(kSecondsPerDay));
+  return static_cast<std::int32_t>(std::clamp(saturatingInt64(days), kFirst, kLast));
+}
+
+plist::Date SqliteStore::dateForDaysSince1970(std::int32_t day) {
+  return plist::Date::ofDay(day);
+}
+
+void SqliteStore::BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) {
+  if (key.size() > limits::kStoreKeyBytes) {
+    site_.log.write(LogLevel::Error, site_.describe({StoreFault::Other,
+                                                     "a key of " + std::to_string(key.size()) +
+                                                         " bytes is refused: use a shorter one"}));
+    return;
+  }
+  pending_[{BHDaysSince1970(), std::string(key)}] = value;
+}
+
+SqliteConnection SqliteStore::openForWriting() {
+  const std::filesystem::path folder = std::filesystem::path(site_.path).parent_path();
+  std::error_code code;
+  std::filesystem::create_directories(folder, code);
+  if (code) {
+    const std::string checkOwner =
+        "check owner and permissions of " + folder.parent_path().string();
+    throw StoreFailure{StoreFault::Refused, "its folder cannot be made: " + code.message() + ": " +
+                                                adviceFor(code.value(), checkOwner.c_str())};
+  }
+  return openStoreForWriting(site_.path, site_.busy);
+}
+
+template <class Operation>
+std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
+  for (bool again = false;; again = true) {
+    const auto identity = FileIdentity::of(site_.path);
+    try {
+      operation(identity);
+      return std::nullopt;
+    } catch (const StoreFailure& failure) {
+      if (failure.fault != StoreFault::Damaged || again) return failure;
+      if (auto obstacle = site_.setAside(identity, failure)) return obstacle;
+    }
+  }
+}
+
+bool SqliteStore::commit() {
+  if (pending_.empty()) return true;
+  const auto failure = attempt([this](const auto&) {
+    SqliteBatch batch(openForWriting(), site_.path);
+    for (const auto& [name, value] : pending_)
+      batch.putScalar(name.first, name.second, value);
+    batch.finish();
+  });
+  if (failure) {
+    site_.tell(*failure,
+               "; " + std::to_string(pending_.size()) + " values wait for the next commit");
+    return false;
+  }
+  pending_.clear();
+  return true;
+}
+
+void SqliteStore::BHClientCheckpoint() {
+  commit();
+  // The last process that closes the store empties its log and removes it.
+  if (!FileIdentity::of(site_.path + "-wal")) return;
+  const auto failure = attempt([this](const auto& identity) {
+    // Just set aside, and the log with it.
+    if (!identity) return;
+    SqliteConnection connection = openForWriting();
+    if (!connection.checkpoint()) {
+      site_.log.write(LogLevel::Default,
+                      site_.describe({StoreFault::Busy,
+                                      "other processes still use the write-ahead log: what they "
+                                      "need stays there until the next checkpoint"}));
+    }
+  });
+  if (failure) site_.tell(*failure);
+}
+
+std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
+    const std::optional<FileIdentity>& identity) {
+  return std::make_unique<SqliteHistory>(site_, identity,
+                                         openStoreForReading(site_.path, site_.busy));
+}
+
+std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
+  std::unique_ptr<SqliteHistory> history;
+  const auto failure = attempt([&](const auto& identity) { history = openForReading(identity); });
+  if (failure) {
+    site_.tell(*failure);
+    history = std::make_unique<SqliteHistory>(site_, std::nullopt, std::nullopt);
+  } else if (!history->hasStore()) {
+    site_.log.write(LogLevel::Info,
+                    site_.describe({StoreFault::Other, "nothing has been recorded yet"}));
+  }
+  return history;
+}
+
+Expected<std::unique_ptr<SqliteHistory>> SqliteStore::openHistory() {
+  std::unique_ptr<SqliteHistory> history;
+  const auto failure = attempt([&](const auto& identity) { history = openForReading(identity); });
+  if (failure) return Error{site_.describe(*failure)};
+  return history;
+}
+
+Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch() {
+  std::unique_ptr<SqliteBatch> batch;
+  const auto failure = attempt(
+      [&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(), site_.path); });
+  if (failure) return Error{site_.describe(*failure)};
+  return batch;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,83 @@
+// The statistics store in a SQLite file of the device.
+//
+// The file is opened when there is something to write or to read and closed again, so that a run
+// with nothing to do never touches it. Scalars that a run sets wait in memory and are committed in
+// one transaction at the checkpoint and at the end of the run.
+//
+//   SqliteStore store(root, clock, preferences, log);
+//   store.BHClientSetValueForScalarKey("com.example.starts", 3);
+//   store.commit();
+//
+// Failures are told to the system log in one line each; values that could not be committed are
+// kept for the next attempt.
+#pragma once
+
+#include <cstdint>
+#include <map>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "base/expected.h"
+#include "base/limits.h"
+#include "platform/clock.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/store/sqlite_batch.h"
+#include "platform/linux/store/sqlite_history.h"
+#include "platform/linux/store/sqlite_site.h"
+#include "platform/preferences.h"
+#include "platform/statistics_store.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+/// The store's file on the device.
+inline constexpr std::string_view kStorePath = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+
+class SqliteStore : public StatisticsStore {
+ public:
+  /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited
+  /// for, in all operations together. `leavesDamaged`: a damaged store is reported and not set
+  /// aside.
+  SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences, SystemLog& log,
+              int busyMilliseconds = limits::kStoreBusyMilliseconds, bool leavesDamaged = false);
+  ~SqliteStore() override;
+
+  std::int32_t BHDaysSince1970() override;
+  plist::Date dateForDaysSince1970(std::int32_t day) override;
+
+  /// When other processes are reading or writing all the time that is waited for, what they still
+  /// need stays in the log; a line says so, and the next checkpoint moves it.
+  void BHClientCheckpoint() override;
+  void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
+  std::unique_ptr<BHHistory> initWithDefaultPath() override;
+
+  /// Commits the values set so far. False when they had to be kept for later.
+  bool commit();
+
+  /// The store's file, under the device root.
+  const std::string& path() const { return site_.path; }
+
+  /// A transaction of many changes; the store is created when there is none.
+  Expected<std::unique_ptr<SqliteBatch>> beginBatch();
+
+  /// The history with its wider set of queries; without rows when there is no store yet.
+  Expected<std::unique_ptr<SqliteHistory>> openHistory();
+
+ private:
+  SqliteConnection openForWriting();
+  std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);
+
+  /// Runs `operation` with the identity of the store's file. When it finds the store damaged, that
+  /// is set aside and the operation runs once more. Yields what then still is in the way.
+  template <class Operation>
+  std::optional<StoreFailure> attempt(Operation operation);
+
+  StoreSite site_;
+  // By day and key.
+  std::map<std::pair<std::int32_t, std::string>, std::int64_t> pending_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,188 @@
+#include "platform/linux/system_log/linux_system_log.h"
+
+#include <array>
+#include <cerrno>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/mman.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <time.h>
+#include <utility>
+
+#include "base/utf8.h"
+#include "platform/linux/files/stamp.h"
+
+namespace tavrel {
+namespace {
+
+struct LevelNames {
+  std::string_view word;
+  char priority;  // of syslog
+};
+
+LevelNames namesOf(LogLevel level) {
+  switch (level) {
+    case LogLevel::Debug:
+      return {"debug", '7'};
+    case LogLevel::Info:
+      return {"info", '6'};
+    case LogLevel::Default:
+      return {"default", '5'};
+    case LogLevel::Error:
+      return {"error", '3'};
+  }
+  return {"default", '5'};
+}
+
+plist::Date now() {
+  timespec time{};
+  clock_gettime(CLOCK_REALTIME, &time);
+  return plist::Date::since1970(static_cast<double>(time.tv_sec) +
+                                static_cast<double>(time.tv_nsec) * 1e-9);
+}
+
+/// Adds a field in the journal's form for values that may hold line ends: the name, a line end,
+/// the length as 64-bit little-endian, the value, a line end.
+void appendField(std::string& out, std::string_view name, std::string_view value) {
+  out += name;
+  out += '\n';
+  for (unsigned shift = 0; shift < 64; shift += 8) {
+    out += static_cast<char>(static_cast<unsigned char>(std::uint64_t{value.size()} >> shift));
+  }
+  out += value;
+  out += '\n';
+}
+
+/// Adds text with its control characters, DEL and malformed bytes as "\xNN": names in messages come
+/// from outside, and a terminal would obey them.
+void appendPrintable(std::string& out, std::string_view text) {
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  while (!text.empty()) {
+    std::string_view rest = text;
+    const char32_t codePoint = takeCodePoint(rest);
+    const std::string_view taken = text.substr(0, text.size() - rest.size());
+    text = rest;
+    const bool malformed = codePoint == kReplacementCharacter && taken.size() == 1;
+    if (codePoint >= 0x20 && (codePoint < 0x7F || codePoint > 0x9F) && !malformed) {
+      out += taken;
+      continue;
+    }
+    for (const char character : taken) {
+      const auto bits = static_cast<unsigned char>(character);
+      out += {'\\', 'x', kDigits[bits >> 4], kDigits[bits & 0xF]};
+    }
+  }
+}
+
+bool writeWhole(int descriptor, std::string_view bytes) {
+  while (!bytes.empty()) {
+    const ssize_t written = ::write(descriptor, bytes.data(), bytes.size());
+    if (written < 0) {
+      if (errno == EINTR) continue;
+      return false;
+    }
+    bytes.remove_prefix(static_cast<std::size_t>(written));
+  }
+  return true;
+}
+
+/// An entry beyond what a datagram holds goes in a sealed memory file.
+bool sendInMemoryFile(int socket, std::string_view entry) {
+  const Descriptor file(memfd_create("tavrel-log", MFD_CLOEXEC | MFD_ALLOW_SEALING));
+  if (!file || !writeWhole(file.get(), entry)) return false;
+  constexpr int kSeals = F_SEAL_SEAL | F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
+  if (fcntl(file.get(), F_ADD_SEALS, kSeals) != 0) return false;
+
+  alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control{};
+  msghdr message{};
+  message.msg_control = control.data();
+  message.msg_controllen = control.size();
+  cmsghdr* header = CMSG_FIRSTHDR(&message);
+  header->cmsg_level = SOL_SOCKET;
+  header->cmsg_type = SCM_RIGHTS;
+  header->cmsg_len = CMSG_LEN(sizeof(int));
+  const int descriptor = file.get();
+  std::memcpy(CMSG_DATA(header), &descriptor, sizeof(descriptor));
+  return sendmsg(socket, &message, MSG_NOSIGNAL) >= 0;
+}
+
+}  // namespace
+
+LinuxSystemLog::LinuxSystemLog(int errorStream, std::string journalSocket)
+    : errorStream_(errorStream), journalPath_(std::move(journalSocket)) {}
+
+void LinuxSystemLog::write(LogLevel level, std::string_view message) {
+  if (way_ == Way::Undecided) {
+    streamIsJournal_ = isStreamTheJournal();
+    way_ = streamIsJournal_ && connectToJournal() ? Way::Journal : Way::Stream;
+  }
+  if (way_ == Way::Journal && sendToJournal(level, message)) return;
+  writeToStream(level, message);
+}
+
+bool LinuxSystemLog::isStreamTheJournal() const {
+  const char* stream = std::getenv("JOURNAL_STREAM");
+  if (!stream) return false;
+  struct stat status {};
+  if (fstat(errorStream_, &status) != 0) return false;
+  return std::to_string(status.st_dev) + ":" + std::to_string(status.st_ino) == stream;
+}
+
+bool LinuxSystemLog::connectToJournal() {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (journalPath_.size() >= sizeof(address.sun_path)) return false;
+  std::memcpy(address.sun_path, journalPath_.c_str(), journalPath_.size());
+  journal_ = Descriptor(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  return journal_ &&
+         connect(journal_.get(), reinterpret_cast<const sockaddr*>(&address), sizeof(address)) == 0;
+}
+
+bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view message) {
+  std::string entry = "PRIORITY=";
+  entry += namesOf(level).priority;
+  entry += "\nSYSLOG_IDENTIFIER=";
+  entry += program_invocation_short_name;
+  entry += '\n';
+  appendField(entry, "MESSAGE", message);
+  while (send(journal_.get(), entry.data(), entry.size(), MSG_NOSIGNAL) < 0) {
+    if (errno == EINTR) continue;
+    if (errno == EMSGSIZE || errno == ENOBUFS) return sendInMemoryFile(journal_.get(), entry);
+    // The journal may have been started anew; entries sent meanwhile go by the stream.
+    connectToJournal();
+    return false;
+  }
+  return true;
+}
+
+void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) const {
+  const LevelNames names = namesOf(level);
+  std::string line;
+  std::string_view continuation = "\n  ";
+  std::string prefix;
+  if (streamIsJournal_) {
+    // The journal takes time and level from its own stamp and from this prefix of every line.
+    prefix = {'\n', '<', names.priority, '>'};
+    continuation = prefix;
+    line = prefix.substr(1);
+  } else {
+    line = preciseStamp(now());
+    line += ' ';
+    line += names.word;
+    line += ' ';
+  }
+  while (true) {
+    const std::size_t end = message.find('\n');
+    appendPrintable(line, message.substr(0, end));
+    if (end == std::string_view::npos) break;
+    line += continuation;
+    message.remove_prefix(end + 1);
+  }
+  line += '\n';
+  writeWhole(errorStream_, line);
+}
+
+}  // namespace tavrel

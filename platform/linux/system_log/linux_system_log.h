@@ -1,0 +1,43 @@
+// The system log: the journal, else standard error.
+//
+// Under the service manager standard error is connected to the journal, and JOURNAL_STREAM says to
+// which stream. Entries then go to the journal's own socket, so that an entry of several lines
+// stays one entry and is not mixed with what is printed on standard error. Otherwise each entry is
+// written on standard error at once, as "TIME LEVEL message", further lines indented and control
+// characters escaped.
+//
+// Every level is written; what to keep and what to show is the journal's business.
+#pragma once
+
+#include <string>
+
+#include "platform/linux/files/descriptor.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class LinuxSystemLog final : public SystemLog {
+ public:
+  static constexpr const char* kJournalSocket = "/run/systemd/journal/socket";
+
+  /// `errorStream` is borrowed.
+  explicit LinuxSystemLog(int errorStream = 2, std::string journalSocket = kJournalSocket);
+
+  void write(LogLevel level, std::string_view message) override;
+
+ private:
+  enum class Way { Undecided, Journal, Stream };
+
+  bool isStreamTheJournal() const;
+  bool connectToJournal();
+  bool sendToJournal(LogLevel level, std::string_view message);
+  void writeToStream(LogLevel level, std::string_view message) const;
+
+  int errorStream_;
+  std::string journalPath_;
+  Descriptor journal_;
+  Way way_ = Way::Undecided;
+  bool streamIsJournal_ = false;
+};
+
+}  // namespace tavrel

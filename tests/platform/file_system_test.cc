@@ -1,0 +1,135 @@
+#include "platform/linux/files/file_system.h"
+
+#include <sys/stat.h>
+
+#include "faulty_file_system.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+std::string messageOf(const auto& outcome) {
+  return outcome ? "" : outcome.error().message;
+}
+
+TEST(FileSystem, ReadsRegularFilesOnlyAndUpToTheLimit) {
+  const TemporaryRoot device;
+  const auto at = [&](std::string_view path) { return device.root.path(path); };
+  FileSystem files;
+  device.write("/full", std::string(5000, 'x'));
+  fs::create_directory(at("/folder"));
+  ASSERT_EQ(mkfifo(at("/fifo").c_str(), 0600), 0);
+
+  EXPECT_EQ(*files.read(at("/full"), 5000), std::string(5000, 'x'));
+  EXPECT_EQ(*files.readIfPresent(at("/none"), 10), std::nullopt);
+
+  const std::pair<std::string_view, std::string_view> kRefused[] = {
+      {"/full", ": it has more than 4999 bytes; move it away"},
+      {"/folder", ": it is a folder; move it away"},
+      {"/fifo", ": it is not a regular file; move it away"}};
+  for (const auto& [path, reason] : kRefused) {
+    EXPECT_EQ(messageOf(files.read(at(path), 4999)),
+              "cannot use " + at(path) + std::string(reason));
+  }
+  EXPECT_EQ(messageOf(files.read(at("/none"), 1)),
+            "cannot read " + at("/none") + ": No such file or directory");
+  EXPECT_NE(messageOf(files.read("/proc/self/status", 10)), "") << "a size that is not told ahead";
+}
+
+TEST(FileSystem, ReplacesWholeFilesAndKeepsTheirMode) {
+  const TemporaryRoot device;
+  FileSystem files;
+  const std::string path = device.root.path("/a/b/file");
+  ASSERT_TRUE(files.replace(path, asBytes("one"), 0640));
+  EXPECT_EQ(FileSystem::status(path)->st_mode & 0777U, 0640U);
+  ASSERT_EQ(chmod(path.c_str(), 0604), 0);
+  ASSERT_TRUE(files.replace(path, asBytes("two"), 0640));
+  EXPECT_EQ(FileSystem::status(path)->st_mode & 0777U, 0604U);
+  {
+    auto abandoned = files.create(path, 0640);
+    ASSERT_TRUE(abandoned);
+    ASSERT_TRUE(abandoned->write(asBytes("three")));
+  }
+  EXPECT_EQ(*files.read(path, 10), "two");
+  EXPECT_EQ(std::distance(fs::directory_iterator(device.root.path("/a/b")), {}), 1);
+
+  fs::create_directory(device.root.path("/folder"));
+  EXPECT_EQ(messageOf(files.replace(device.root.path("/folder"), asBytes("x"), 0644)),
+            "cannot put in place " + device.root.path("/folder") + ": Is a directory");
+}
+
+TEST(FileSystem, RemovesTemporaryFilesOnceTheyAreOld) {
+  const TemporaryRoot device;
+  const auto now = fs::file_time_type::clock::now();
+  const std::tuple<const char*, int, bool> kFiles[] = {
+      {"/d/.tavrel-0000000000000001.tmp", 25, false},
+      {"/d/.tavrel-0000000000000002.tmp", 23, true},
+      {"/d/.tavrel-0000000000000003.tmp", -25, false},  // the clock was set back
+      {"/d/tavrel-0000000000000005.tmp", 25, true}};
+  for (const auto& [name, age, stays] : kFiles) {
+    device.write(name, "x");
+    fs::last_write_time(device.root.path(name), now - std::chrono::hours(age));
+  }
+  FileSystem files;
+  ASSERT_TRUE(files.replace(device.root.path("/d/file"), asBytes("x"), 0644));
+  for (const auto& [name, age, stays] : kFiles)
+    EXPECT_EQ(fs::exists(device.root.path(name)), stays) << name;
+}
+
+TEST(FileSystem, AppendsWholeLines) {
+  const TemporaryRoot device;
+  FileSystem files;
+  const std::string path = device.root.path("/logs/lines");
+  {
+    auto file = files.openToAppend(path, 0640);
+    ASSERT_TRUE(file && file->append(asBytes("one\n"), 100));
+    ASSERT_TRUE(file->append(asBytes("tw"), 100));  // as a cut leaves it
+  }
+  auto file = files.openToAppend(path, 0640);
+  ASSERT_TRUE(file && file->append(asBytes("three\n"), 100) && file->append(asBytes("4\n"), 100));
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n");
+  EXPECT_EQ(messageOf(file->append(asBytes("five\n"), 19)),
+            "cannot append to " + path + ": it may have 19 bytes");
+  ASSERT_TRUE(file->append(asBytes("5\n"), 19));
+  file = Error{"released"};
+
+  FaultyFileSystem faulty(device.root.path("/"), FaultyFileSystem::Fault::Failure, 2);
+  auto full = faulty.openToAppend(path, 0640);
+  EXPECT_EQ(messageOf(full->append(asBytes("six\n"), 100)),
+            "cannot write " + path + ": No space left on device; free some space");
+  EXPECT_TRUE(full->append(asBytes("seven\n"), 100));
+  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n5\nseven\n");
+}
+
+TEST(FileSystem, AReplacedFileIsOldOrNewAfterEveryFault) {
+  for (const auto fault : FaultyFileSystem::kFaults) {
+    int call = 1;
+    for (bool struck = true; struck; ++call) {
+      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
+      const TemporaryRoot device;
+      device.write("/kept/file", "old");
+      FaultyFileSystem faulty(device.root.path("/"), fault, call);
+      const std::string inOld = device.root.path("/kept/file");
+      const std::string inNew = device.root.path("/new/folder/file");
+      const bool oldDone = static_cast<bool>(faulty.replace(inOld, asBytes("content"), 0644));
+      const bool newDone = static_cast<bool>(faulty.replace(inNew, asBytes("content"), 0644));
+      struck = faulty.hasStruck();
+      faulty.settle();
+
+      QuickFileSystem files;
+      const std::string kept = *files.read(inOld, 100);
+      EXPECT_TRUE(kept == "content" || (!oldDone && kept == "old")) << kept;
+      const auto made = *files.readIfPresent(inNew, 100);
+      EXPECT_TRUE(made == "content" || (!newDone && !made)) << made.value_or("(none)");
+      EXPECT_TRUE(files.replace(inNew, asBytes("again"), 0644));
+      EXPECT_EQ(*files.read(inNew, 100), "again");
+      ASSERT_LT(call, 100);
+    }
+    EXPECT_GT(call, 10) << "the sequence is not that short";
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,211 @@
+#include "tools/device/prefs_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <ostream>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/plist/xml.h"
+#include "tools/shared/input_file.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
+#include "tools/shared/typed_value.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string domain;
+  std::string key;
+  std::string value;
+  ArgumentKind kind = ArgumentKind::Text;
+  bool kindGiven = false;
+  bool isDocument = false;
+};
+
+bool checkDomain(ToolContext& context, const std::string& domain) {
+  if (FilePreferences::isValidDomain(domain)) return true;
+  context.failUsage(
+      format("not a preference domain: %s: give a name such as com.example.app, "
+             "without slashes",
+             domain));
+  return false;
+}
+
+void failAbsent(ToolContext& context, const Arguments& arguments) {
+  // An unreadable domain has been complained of.
+  if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
+  context.fail(
+      format("no preference %s in domain %s: 'tavrelctl prefs list %s' shows what there is",
+             arguments.key, arguments.domain, arguments.domain));
+}
+
+// Stores a value, null to remove the key. When that cannot be done, a note has said why.
+void store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
+  Preferences& preferences = context.preferences();
+  preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
+  if (!preferences.ZTXPreferencesSynchronize(arguments.domain) ||
+      preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain) != value) {
+    context.setExitStatus(kExitFailure);
+  }
+}
+
+void get(ToolContext& context, const Arguments& arguments) {
+  if (!checkDomain(context, arguments.domain)) return;
+  const auto value = context.preferences().ZTXPreferencesGetValue(arguments.key, arguments.domain);
+  if (!value) return failAbsent(context, arguments);
+  if (context.json()) {
+    return context.printJson({{"domain", arguments.domain},
+                              {"key", arguments.key},
+                              {"type", kindName(value)},
+                              {"value", jsonOf(value)}});
+  }
+  if (const auto text = value.string()) {
+    context.out() << *text << '\n';
+  } else {
+    printOutline(context.out(), value);
+  }
+}
+
+Expected<plist::Value> valueOf(ToolContext& context, const Arguments& arguments) {
+  if (!arguments.isDocument) return parseArgument(arguments.value, arguments.kind);
+  if (arguments.value == "-") return readDocument(context, "-");
+  if (arguments.value.starts_with('@')) return readDocument(context, arguments.value.substr(1));
+  return decodeDocument(arguments.value, "VALUE");
+}
+
+// A permission that was stored as the text "true" permits nothing; better said than searched for.
+void noteTextThatReadsOtherwise(ToolContext& context, const Arguments& arguments) {
+  if (arguments.kindGiven) return;
+  const std::string& text = arguments.value;
+  if (text == "true" || text == "false") {
+    context.note(format("stored as a string: %s: use --bool for a boolean", text));
+  } else if (parseArgument(text, ArgumentKind::Real)) {
+    context.note(format("stored as a string: %s: use --int or --float for a number", text));
+  }
+}
+
+void set(ToolContext& context, const Arguments& arguments) {
+  if (!checkDomain(context, arguments.domain)) return;
+  const auto value = valueOf(context, arguments);
+  if (!value) return context.failUsage(value.error().message);
+  if (!isXmlText(arguments.key) || !hasXmlTextsOnly(*value)) {
+    return context.failUsage(
+        "cannot be stored: property lists hold no control characters and only UTF-8: give such "
+        "bytes as --plist '{\"$data\": \"BASE64\"}'");
+  }
+  const auto xml = plist::writeXml(*value);
+  if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
+  noteTextThatReadsOtherwise(context, arguments);
+  // As it will be read back: dates, for one, lose their fraction.
+  store(context, arguments, *plist::readXml(asBytes(*xml)));
+}
+
+void remove(ToolContext& context, const Arguments& arguments) {
+  if (!checkDomain(context, arguments.domain)) return;
+  FilePreferences& preferences = context.preferences();
+  if (!preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain)) {
+    return failAbsent(context, arguments);
+  }
+  store(context, arguments, {});
+}
+
+void listDomains(ToolContext& context) {
+  const auto domains = context.preferences().domains();
+  if (!domains) return context.fail(domains.error().message);
+  if (context.json()) return context.printJson({{"domains", *domains}});
+  for (const std::string& domain : *domains)
+    context.out() << printable(domain) << '\n';
+}
+
+void list(ToolContext& context, const Arguments& arguments) {
+  if (arguments.domain.empty()) return listDomains(context);
+  if (!checkDomain(context, arguments.domain)) return;
+  const auto values = context.preferences().values(arguments.domain);
+  if (context.hasComplaints()) context.setExitStatus(kExitFailure);
+  if (context.json()) {
+    return context.printJson({{"domain", arguments.domain}, {"values", jsonOf(values)}});
+  }
+  Table table({{"KEY"}, {"TYPE"}, {"VALUE"}});
+  std::vector<const plist::Entry*> entries;
+  for (const plist::Entry& entry : values)
+    entries.push_back(&entry);
+  std::sort(entries.begin(), entries.end(),
+            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
+  for (const plist::Entry* entry : entries) {
+    table.add({std::string(entry->key.view()), std::string(kindName(entry->value)),
+               inlineText(entry->value)});
+  }
+  if (!table.empty()) table.print(context.out(), context.columns());
+}
+
+void addKindOptions(CLI::App& command, const std::shared_ptr<Arguments>& arguments) {
+  auto* kinds = command.add_option_group("Kind of VALUE");
+  kinds->require_option(0, 1);
+  const auto add = [&](const char* name, ArgumentKind kind, const char* description) {
+    kinds->add_flag_callback(
+        name,
+        [arguments, kind] {
+          arguments->kind = kind;
+          arguments->kindGiven = true;
+        },
+        description);
+  };
+  add("--string", ArgumentKind::Text, "A text (the default)");
+  add("--bool", ArgumentKind::Boolean, "true or false");
+  add("--int", ArgumentKind::Integer, "A decimal integer of at most 64 bits");
+  add("--float", ArgumentKind::Real, "A real number");
+  add("--date", ArgumentKind::Date, "YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD, UTC");
+  kinds->add_flag_callback(
+      "--plist",
+      [arguments] {
+        arguments->isDocument = true;
+        arguments->kindGiven = true;
+      },
+      "A property list or JSON: the document itself, @FILE, or - for standard input");
+}
+
+}  // namespace
+
+void addPrefsCommands(CLI::App& app, ToolContext& context) {
+  auto* group = app.add_subcommand("prefs", "Read and write preferences");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+  const auto add = [&](const char* name, const char* description,
+                       void (*action)(ToolContext&, const Arguments&)) {
+    auto* command = group->add_subcommand(name, description);
+    command->callback([&context, arguments, action] { action(context, *arguments); });
+    return command;
+  };
+  const auto addDomain = [&](CLI::App& command) {
+    return command.add_option("DOMAIN", arguments->domain, "Preference domain");
+  };
+  const auto addKey = [&](CLI::App& command) {
+    command.add_option("KEY", arguments->key, "Preference key")->required();
+  };
+
+  auto* getCommand = add("get", "Print the value of a key", get);
+  addDomain(*getCommand)->required();
+  addKey(*getCommand);
+  context.addJsonOption(*getCommand);
+
+  auto* setCommand = add("set", "Set a key", set);
+  addDomain(*setCommand)->required();
+  addKey(*setCommand);
+  setCommand->add_option("VALUE", arguments->value, "The value")->required();
+  addKindOptions(*setCommand, arguments);
+
+  auto* deleteCommand = add("delete", "Remove a key", remove);
+  addDomain(*deleteCommand)->required();
+  addKey(*deleteCommand);
+
+  auto* listCommand = add("list", "List the keys of a domain, or the domains", list);
+  addDomain(*listCommand);
+  context.addJsonOption(*listCommand);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,208 @@
+#include "tools/device/send_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <array>
+#include <chrono>
+#include <cstddef>
+#include <memory>
+#include <optional>
+#include <ostream>
+#include <string>
+
+#include "base/format.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/service/file_notifications.h"
+#include "platform/linux/service/service_client.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/input_file.h"
+#include "tools/shared/table.h"
+#include "tools/shared/typed_value.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kServiceName = "com.norvane.tallied.tavrel";
+
+constexpr std::int64_t kAnnounce = 0;
+constexpr std::int64_t kForceDay = 1;
+constexpr std::int64_t kDeliver = 2;
+
+constexpr std::size_t kUuidBytes = 16;
+
+std::optional<unsigned> hexDigit(char c) {
+  if (c >= '0' && c <= '9') return static_cast<unsigned>(c - '0');
+  if (c >= 'a' && c <= 'f') return static_cast<unsigned>(c - 'a') + 10;
+  if (c >= 'A' && c <= 'F') return static_cast<unsigned>(c - 'A') + 10;
+  return std::nullopt;
+}
+
+/// Five groups of 8, 4, 4, 4 and 12 hexadecimal digits, joined by "-".
+plist::Data parseUuid(std::string_view text) {
+  constexpr std::size_t kTextLength = 36;
+  if (text.size() != kTextLength) return {};
+  std::array<std::byte, kUuidBytes> bytes{};
+  std::size_t digits = 0;
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (i == 8 || i == 13 || i == 18 || i == 23) {
+      if (text[i] != '-') return {};
+      continue;
+    }
+    const auto digit = hexDigit(text[i]);
+    if (!digit) return {};
+    bytes[digits / 2] = bytes[digits / 2] << 4 | static_cast<std::byte>(*digit);
+    ++digits;
+  }
+  return plist::Data(bytes);
+}
+
+plist::Data uuidOf(const plist::Value& value) {
+  if (const auto text = value.string()) return parseUuid(*text);
+  const plist::Data data = value.data();
+  return data && data.size() == kUuidBytes ? data : plist::Data();
+}
+
+bool isInteger(const plist::Value& value) {
+  const auto number = value.number();
+  return number && !number->isFloating();
+}
+
+void send(ToolContext& context, const plist::Dictionary& message, const std::string& done) {
+  auto client = ServiceClient::connect(context.root(), kServiceName);
+  if (!client) return context.fail(client.error().message);
+  if (const auto sent = client->send(message); !sent) return context.fail(sent.error().message);
+  context.out() << done << '\n';
+}
+
+void force(ToolContext& context, const std::string& dayArgument) {
+  const auto day = parseDay(dayArgument, context.platform().statistics->BHDaysSince1970());
+  if (!day) return context.failUsage(day.error().message);
+  send(context, {{"operation", kForceDay}, {"value", std::int64_t{*day}}},
+       format("Asked for the daily tasks of day %s.", dayText(*day)));
+}
+
+void deliver(ToolContext& context, const std::string& file) {
+  const auto document = readDocument(context, file);
+  if (!document) return context.fail(document.error().message);
+  const auto applications = appDataOf(*document);
+  if (!applications) {
+    const std::string_view name = file == "-" ? "standard input" : std::string_view(file);
+    return context.fail(format("%s: %s", name, applications.error().message));
+  }
+  send(context, {{"operation", kDeliver}, {"app_data", *applications}},
+       format("Delivered %s.", counted(applications->size(), "application")));
+}
+
+void printCount(ToolContext& context, const std::string& name, std::uint64_t count) {
+  if (context.json()) return context.printJson({{"name", name}, {"count", count}});
+  context.out() << name << ": posted " << counted(count, "time") << '\n';
+}
+
+void wait(ToolContext& context, const std::string& name, const std::string& timeout) {
+  // Beyond what any wait lasts; a conversion of more would not be defined.
+  constexpr double kLongestSeconds = 1e9;
+  double longest = kLongestSeconds;
+  if (!timeout.empty()) {
+    const auto seconds = parseArgument(timeout, ArgumentKind::Real);
+    if (!seconds || !(seconds->number()->real() >= 0)) {
+      return context.failUsage(
+          format("not a number of seconds: %s: give 0 or more, such as 2.5", timeout));
+    }
+    longest = std::min(seconds->number()->real(), kLongestSeconds);
+  }
+  const FileNotifications notifications(context.root(), context.platform().log);
+  const auto seen = notifications.count(name);
+  if (!seen) return context.fail(seen.error().message);
+  const auto count = notifications.waitBeyond(
+      name, *seen, std::chrono::milliseconds(static_cast<std::int64_t>(longest * 1000)));
+  if (!count) return context.fail(count.error().message);
+  if (*count == *seen) {
+    return context.fail(format("%s was not posted within %g seconds", name, longest));
+  }
+  printCount(context, name, *count);
+}
+
+void post(ToolContext& context, const std::string& name) {
+  FileNotifications notifications(context.root(), context.platform().log);
+  const auto count = notifications.tryPost(name);
+  if (!count) return context.fail(count.error().message);
+  printCount(context, name, *count);
+}
+
+void addNotifyCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* group = app.add_subcommand("notify", "Notifications");
+  group->require_subcommand(1);
+  const auto name = std::make_shared<std::string>();
+  const auto timeout = std::make_shared<std::string>();
+
+  CLI::App* waitCommand = group->add_subcommand("wait", "Wait until a notification is posted");
+  waitCommand->add_option("NAME", *name, "Such as com.norvane.tallied.tavrel.logging")->required();
+  waitCommand->add_option("--timeout", *timeout, "Give up after so long, with exit status 1")
+      ->type_name("SECONDS");
+  context.addJsonOption(*waitCommand);
+  waitCommand->callback([&context, name, timeout] { wait(context, *name, *timeout); });
+
+  CLI::App* postCommand = group->add_subcommand("post", "Post a notification");
+  postCommand->add_option("NAME", *name, "The notification")->required();
+  context.addJsonOption(*postCommand);
+  postCommand->callback([&context, name] { post(context, *name); });
+}
+
+}  // namespace
+
+Expected<plist::Array> appDataOf(const plist::Value& applications) {
+  const plist::Array elements = applications.array();
+  if (!elements) return Error{"no array of applications"};
+  plist::Array result = plist::Array::create(elements.size());
+  for (std::size_t i = 0; i < elements.size(); ++i) {
+    const plist::Dictionary application = elements.at(i).dictionary();
+    const auto wrong = [i](std::string_view entry, std::string_view wanted) {
+      return Error{format("application %llu: \"%s\" must be %s", std::uint64_t{i}, entry, wanted)};
+    };
+    if (!application) return Error{format("element %llu is no dictionary", std::uint64_t{i})};
+    plist::Dictionary checked = plist::Dictionary::create(5);
+    for (const std::string_view entry : {"bundle_id", "version"}) {
+      if (!application.string(entry)) return wrong(entry, "a string");
+      checked.set(entry, application.get(entry));
+    }
+    for (const std::string_view entry : {"orbo_id", "arch"}) {
+      if (!isInteger(application.get(entry))) return wrong(entry, "an integer");
+      checked.set(entry, application.get(entry));
+    }
+    const plist::Data uuid = uuidOf(application.get("uuid"));
+    if (!uuid) return wrong("uuid", "a UUID, as text of 36 characters or 16 bytes of data");
+    checked.set("uuid", uuid);
+    result.append(checked);
+  }
+  return result;
+}
+
+void addSendCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* group = app.add_subcommand("send", "Send a message to the service, as a client does");
+  group->require_subcommand(1);
+
+  CLI::App* announceCommand =
+      group->add_subcommand("announce", "Announce that app information will be delivered");
+  announceCommand->callback([&context] {
+    send(context, {{"operation", kAnnounce}}, "Announced app information.");
+  });
+
+  CLI::App* forceCommand = group->add_subcommand("force", "Have the daily tasks of a day run");
+  const auto day = std::make_shared<std::string>();
+  forceCommand->add_option("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD")->required();
+  forceCommand->callback([&context, day] { force(context, *day); });
+
+  CLI::App* deliverCommand = group->add_subcommand("deliver", "Deliver app information");
+  const auto file = std::make_shared<std::string>();
+  deliverCommand
+      ->add_option(
+          "FILE", *file,
+          "Property list or JSON: an array of dictionaries with \"bundle_id\", \"version\", "
+          "\"orbo_id\", \"arch\" and \"uuid\"; - for standard input")
+      ->required();
+  deliverCommand->callback([&context, file] { deliver(context, *file); });
+
+  addNotifyCommands(app, context);
+}
+
+}  // namespace tavrel

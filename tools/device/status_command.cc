@@ -1,0 +1,142 @@
+#include "tools/device/status_command.h"
+
+#include <CLI/CLI.hpp>
+#include <ostream>
+
+#include "base/arithmetic.h"
+#include "base/format.h"
+#include "config/persisted_state.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+struct DeviceStatus {
+  std::optional<bool> submissionAllowed;  // nothing when preferences cannot be read
+  std::int32_t today = 0;
+  bool isStateReadable = true;           // the daemon's own preferences
+  std::optional<std::int32_t> lastDay;   // of the gated run
+  std::optional<std::string> osVersion;  // of the last log
+  std::string storePath;
+  std::optional<std::int64_t> storeBytes;  // with its write-ahead log; nothing without a store
+  Expected<SqliteHistory::Holdings> holdings = SqliteHistory::Holdings{};
+  Expected<std::vector<FileSubmission::FiledLog>> pending = Error{};
+};
+
+std::optional<std::int64_t> bytesOfStore(const std::string& path) {
+  const auto database = FileSystem::status(path);
+  if (!database) return std::nullopt;
+  const auto log = FileSystem::status(path + "-wal");
+  return database->st_size + (log ? log->st_size : 0);
+}
+
+DeviceStatus takeStatus(ToolContext& context) {
+  LinuxPlatform& device = context.linuxPlatform();
+  Platform& platform = device.platform();
+  DeviceStatus status;
+  const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
+      "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
+  if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
+  status.today = platform.statistics->BHDaysSince1970();
+  bool hasRun = false;
+  const auto lastDay =
+      context.preferences().ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
+  if (hasRun) status.lastDay = lowInt32(lastDay);
+  if (const auto version =
+          context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
+    status.osVersion = *version;
+  }
+  status.isStateReadable = !context.hasComplaints();
+  status.storePath = context.storeForReading().path();
+  status.storeBytes = bytesOfStore(status.storePath);
+  if (status.storeBytes) {
+    const auto history = context.storeForReading().openHistory();
+    if (history) {
+      status.holdings = (*history)->holdings();
+    } else {
+      status.holdings = history.error();
+    }
+  }
+  status.pending = device.submission().logs(FileSubmission::Place::Pending);
+  return status;
+}
+
+Json jsonOfDay(std::optional<std::int32_t> day) {
+  if (!day) return nullptr;
+  return {{"day", *day}, {"date", dayDateText(*day)}};
+}
+
+void printJson(ToolContext& context, const DeviceStatus& status) {
+  Json store = {{"path", status.storePath}, {"bytes", nullptr}, {"days", nullptr}};
+  if (status.storeBytes) store["bytes"] = *status.storeBytes;
+  if (status.holdings) {
+    store["days"] = status.holdings->days;
+    if (status.holdings->days > 0) {
+      store["first_day"] = jsonOfDay(status.holdings->firstDay);
+      store["last_day"] = jsonOfDay(status.holdings->lastDay);
+    }
+  }
+  context.printJson(
+      {{"submission_allowed",
+        status.submissionAllowed ? Json(*status.submissionAllowed) : Json(nullptr)},
+       {"today", jsonOfDay(status.today)},
+       {"last_reported_day", jsonOfDay(status.lastDay)},
+       {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
+       {"store", std::move(store)},
+       {"pending_logs", status.pending ? Json(status.pending->size()) : Json(nullptr)}});
+}
+
+std::string storeText(const DeviceStatus& status) {
+  if (!status.storeBytes) return "none yet";
+  std::string text = format("%lld bytes", *status.storeBytes);
+  if (!status.holdings) return text + ", unreadable";
+  const SqliteHistory::Holdings& held = *status.holdings;
+  if (held.days == 0) return text + ", empty";
+  if (held.days == 1) return text + format(", 1 day held: %s", dayText(held.firstDay));
+  return text + format(", %lld days held: %s to %s", held.days, dayText(held.firstDay),
+                       dayText(held.lastDay));
+}
+
+void printText(ToolContext& context, const DeviceStatus& status) {
+  Table table({{""}, {""}});
+  const char* const none = status.isStateReadable ? "none yet" : "unknown";
+  table.add({"Submission", !status.submissionAllowed ? "unknown"
+                           : *status.submissionAllowed
+                               ? "allowed"
+                               : "not allowed (allow it with: tavrelctl prefs set "
+                                 "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)"});
+  table.add({"Today", dayText(status.today)});
+  table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
+  table.add({"Last OS version", status.osVersion.value_or(none)});
+  table.add({"Store", storeText(status)});
+  table.add({"Store file", status.storePath});
+  table.add(
+      {"Pending logs", status.pending ? std::to_string(status.pending->size()) : "unreadable"});
+  table.print(context.out(), std::nullopt);
+}
+
+}  // namespace
+
+void addStatusCommand(CLI::App& app, ToolContext& context) {
+  auto* command = app.add_subcommand("status", "Show what tavrel may do, has done and holds");
+  context.addJsonOption(*command);
+  command->callback([&context] {
+    const DeviceStatus status = takeStatus(context);
+    if (context.json()) {
+      printJson(context, status);
+    } else {
+      printText(context, status);
+    }
+    if (context.hasComplaints()) context.setExitStatus(kExitFailure);
+    if (!status.holdings) context.fail(status.holdings.error().message);
+    if (!status.pending) context.fail(status.pending.error().message);
+  });
+}
+
+}  // namespace tavrel

@@ -1,0 +1,192 @@
+#include "tools/device/tasking_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <cstddef>
+#include <memory>
+#include <ostream>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "config/persisted_state.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/platform.h"
+#include "tools/device/tasking_document.h"
+#include "tools/shared/input_file.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+/// More findings than this say nothing new about a document.
+constexpr std::size_t kFindingsShown = 20;
+
+/// A tasking as preferences hold it; whatever they hold, since others write them too.
+struct Tasking {
+  plist::Value identifier;
+  plist::Value system;  // only of an applied one
+  plist::Value digest;
+  plist::Value payload;
+};
+
+struct Taskings {
+  explicit Taskings(ToolContext& context)
+      : document(
+            context.preferences().ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)) {
+    const plist::Dictionary dictionary = document.dictionary();
+    scheduled = {dictionary.get(kTaskingIDKey),
+                 {},
+                 dictionary.get(kTaskingDigestKey),
+                 dictionary.get(kTaskingPayloadKey)};
+    const auto get = [&](std::string_view key) {
+      return context.preferences().ZTXPreferencesGetValue(key, kTavrelDomain);
+    };
+    applied = {get(kTaskingIDKey), get(kTaskingOSKey), get(kTaskingDigestKey),
+               get(kTaskingPayloadKey)};
+    lastUpdate = get(kLastOSUpdateKey).dictionary();
+    build =
+        context.platform().systemVersion->systemVersionDictionary().get(kProductBuildVersionKey);
+  }
+
+  /// What the next daily run will do.
+  std::string_view nextRun() const {
+    if (!scheduled.identifier) return "changes nothing";
+    if (!applied.identifier) return "applies the scheduled tasking";
+    if (scheduled.identifier == applied.identifier && applied.system == build) {
+      return "changes nothing";
+    }
+    return "takes the applied tasking back and applies the scheduled one";
+  }
+
+  plist::Value document;
+  Tasking scheduled;
+  Tasking applied;
+  plist::Dictionary lastUpdate;
+  plist::Value build;
+};
+
+std::string text(const plist::Value& value) {
+  if (!value) return "-";
+  return value.string() ? std::string(*value.string()) : inlineText(value);
+}
+
+Json json(const Tasking& tasking) {
+  if (!tasking.identifier && !tasking.payload) return nullptr;
+  Json object = {{"TaskingID", jsonOf(tasking.identifier)}};
+  if (tasking.system) object["TaskingOS"] = jsonOf(tasking.system);
+  object["TaskingDigest"] = jsonOf(tasking.digest);
+  object["TaskingPayload"] = jsonOf(tasking.payload);
+  return object;
+}
+
+void print(ToolContext& context, std::string_view title, const Tasking& tasking) {
+  std::ostream& out = context.out();
+  out << title << ": ";
+  if (!tasking.identifier && !tasking.payload) {
+    out << "none\n";
+    return;
+  }
+  out << printable(text(tasking.identifier)) << '\n';
+  if (tasking.system) out << "  OS build: " << printable(text(tasking.system)) << '\n';
+  out << "  digest: " << printable(text(tasking.digest)) << '\n';
+  const plist::Array settings = tasking.payload.array();
+  out << "  settings: " << (settings ? std::to_string(settings.size()) : "none") << '\n';
+  Table table({{"DOMAIN"}, {"KEY"}, {"VALUE"}}, 4);
+  for (const plist::Value& setting : settings) {
+    const plist::Dictionary dictionary = setting.dictionary();
+    table.add({text(dictionary.get("Domain")), text(dictionary.get("Key")),
+               inlineText(dictionary.get("Value"))});
+  }
+  if (!table.empty()) table.print(out, context.columns());
+}
+
+void show(ToolContext& context) {
+  const Taskings taskings(context);
+  // What cannot be read must not look like what is not there.
+  if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
+  if (context.json()) {
+    const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);
+    context.printJson({{"scheduled", json(taskings.scheduled)},
+                       {"applied", json(taskings.applied)},
+                       {"LastOSUpdate", lastUpdate},
+                       {"next_run", taskings.nextRun()}});
+    return;
+  }
+  print(context, "Scheduled tasking", taskings.scheduled);
+  print(context, "Applied tasking", taskings.applied);
+  context.out() << "Last OS update: ";
+  if (taskings.lastUpdate) {
+    context.out() << printable(text(taskings.lastUpdate.get("version"))) << ", first seen on day "
+                  << printable(text(taskings.lastUpdate.get("day"))) << '\n';
+  } else {
+    context.out() << "none seen\n";
+  }
+  context.out() << "The next daily run " << taskings.nextRun() << ".\n";
+}
+
+bool store(ToolContext& context, const plist::Value& tasking) {
+  Preferences& preferences = context.preferences();
+  preferences.ZTXPreferencesSetValue(kScheduledTaskingKey, tasking, kScheduleDomain);
+  if (preferences.ZTXPreferencesSynchronize(kScheduleDomain)) return true;
+  context.setExitStatus(kExitFailure);  // a note has said why
+  return false;
+}
+
+void schedule(ToolContext& context, const std::string& path) {
+  const auto tasking = readDocument(context, path);
+  if (!tasking) return context.fail(tasking.error().message);
+
+  const std::string name = path == "-" ? "standard input" : path;
+  const std::vector<std::string> findings = checkTasking(*tasking);
+  for (std::size_t i = 0; i < findings.size() && i < kFindingsShown; ++i) {
+    context.fail(name + ": " + findings[i]);
+  }
+  if (findings.size() > kFindingsShown) {
+    context.note(name + ": " + std::to_string(findings.size() - kFindingsShown) +
+                 " more findings of this kind");
+  }
+  if (!findings.empty() || !store(context, *tasking)) return;
+
+  const plist::Dictionary dictionary = tasking->dictionary();
+  context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey)))
+                << " with " << dictionary.array("TaskingPayload").size()
+                << " settings. The next daily run " << Taskings(context).nextRun() << ".\n";
+}
+
+void clear(ToolContext& context) {
+  const Taskings taskings(context);
+  if (!taskings.document && context.hasComplaints()) return context.setExitStatus(kExitFailure);
+  if (!taskings.document) {
+    context.out() << "No tasking is scheduled.\n";
+    return;
+  }
+  if (!store(context, {})) return;
+  context.out() << "Removed scheduled tasking " << printable(text(taskings.scheduled.identifier))
+                << ". Settings that were applied stay in force.\n";
+}
+
+}  // namespace
+
+void addTaskingCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* group = app.add_subcommand("tasking", "Settings that the device is tasked with");
+  group->require_subcommand(1);
+
+  CLI::App* showCommand =
+      group->add_subcommand("show", "Show the scheduled and the applied tasking");
+  context.addJsonOption(*showCommand);
+  showCommand->callback([&context] { show(context); });
+
+  CLI::App* scheduleCommand = group->add_subcommand(
+      "schedule", "Check a tasking, a property list or JSON, and schedule it");
+  auto path = std::make_shared<std::string>();
+  scheduleCommand->add_option("FILE", *path, "The tasking; - for standard input")->required();
+  scheduleCommand->callback([&context, path] { schedule(context, *path); });
+
+  CLI::App* clearCommand = group->add_subcommand("clear", "Remove the scheduled tasking");
+  clearCommand->callback([&context] { clear(context); });
+}
+
+}  // namespace tavrel

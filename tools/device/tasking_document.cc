@@ -1,0 +1,112 @@
+#include "tools/device/tasking_document.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <initializer_list>
+#include <optional>
+#include <set>
+#include <string_view>
+#include <utility>
+
+#include "platform/linux/preferences/file_preferences.h"
+#include "tools/shared/typed_value.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+class Findings {
+ public:
+  void add(const std::string& path, std::string_view message) {
+    lines_.push_back(path + ": " + std::string(message));
+  }
+
+  /// The text under `key`, or nothing after a finding.
+  std::optional<std::string_view> requireText(const plist::Dictionary& dictionary,
+                                              std::string_view key, const std::string& path) {
+    const plist::Value value = dictionary.get(key);
+    const auto text = dictionary.string(key);
+    if (!value) {
+      add(path, "is missing");
+    } else if (!text) {
+      add(path, "must be a string, not " + kindWithArticle(value));
+    } else if (text->empty()) {
+      add(path, "must not be empty");
+    } else {
+      return text;
+    }
+    return std::nullopt;
+  }
+
+  void refuseOtherKeys(const plist::Dictionary& dictionary, const std::string& path,
+                       std::initializer_list<std::string_view> known) {
+    for (const plist::Entry& entry : dictionary) {
+      const std::string_view key = entry.key.view();
+      if (std::find(known.begin(), known.end(), key) != known.end()) continue;
+      std::string message = "has no meaning; a device knows";
+      for (const std::string_view name : known) {
+        message += name == *known.begin() ? " " : ", ";
+        message += name;
+      }
+      add(path + std::string(key), message);
+    }
+  }
+
+  /// Preferences are kept as XML.
+  void refuseOtherTexts(const plist::Value& value, const std::string& path) {
+    if (hasXmlTextsOnly(value)) return;
+    add(path,
+        "holds text that no preference can: property lists hold no control characters and only "
+        "UTF-8: give such bytes as data");
+  }
+
+  std::vector<std::string> take() { return std::move(lines_); }
+
+ private:
+  std::vector<std::string> lines_;
+};
+
+}  // namespace
+
+std::vector<std::string> checkTasking(const plist::Value& tasking) {
+  Findings findings;
+  const plist::Dictionary dictionary = tasking.dictionary();
+  if (!dictionary) {
+    findings.add("tasking", "must be a dictionary, not " + kindWithArticle(tasking));
+    return findings.take();
+  }
+  findings.refuseOtherKeys(dictionary, "", {"TaskingID", "TaskingDigest", "TaskingPayload"});
+  findings.requireText(dictionary, "TaskingID", "TaskingID");
+  findings.refuseOtherTexts(dictionary.get("TaskingID"), "TaskingID");
+  findings.refuseOtherTexts(dictionary.get("TaskingDigest"), "TaskingDigest");
+  const plist::Value payload = dictionary.get("TaskingPayload");
+  if (payload && !payload.array()) {
+    findings.add("TaskingPayload", "must be an array, not " + kindWithArticle(payload));
+  }
+
+  std::set<std::pair<std::string_view, std::string_view>> settings;
+  std::size_t index = 0;
+  const plist::Array array = payload.array();
+  for (const plist::Value& element : array) {
+    const std::string path = "TaskingPayload[" + std::to_string(index++) + "]";
+    findings.refuseOtherTexts(element, path);
+    const plist::Dictionary setting = element.dictionary();
+    if (!setting) {
+      findings.add(path, "must be a dictionary, not " + kindWithArticle(element));
+      continue;
+    }
+    findings.refuseOtherKeys(setting, path + "/", {"Domain", "Key", "Value"});
+    const auto domain = findings.requireText(setting, "Domain", path + "/Domain");
+    const auto key = findings.requireText(setting, "Key", path + "/Key");
+    if (domain && !FilePreferences::isValidDomain(*domain)) {
+      findings.add(path + "/Domain", "is no name of a preference domain");
+    }
+    if (!setting.contains("Value")) findings.add(path + "/Value", "is missing");
+    if (domain && key && !settings.emplace(*domain, *key).second) {
+      findings.add(path, "sets the same key as an earlier setting");
+    }
+  }
+  return findings.take();
+}
+
+}  // namespace tavrel

@@ -1,0 +1,23 @@
+// A tasking as operators write it: a property list or JSON (tools/shared/json_value.h) of the form
+//
+//   {"TaskingID": "fleet-7",
+//    "TaskingDigest": "5d41402a",
+//    "TaskingPayload": [
+//      {"Domain": "com.norvane.da", "Key": "AggressiveSubmissionDays", "Value": 3}]}
+//
+// TaskingDigest may be any value, and may be absent. TaskingPayload may be absent: the device then
+// takes back what it applied before and applies nothing.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// What keeps a device from applying the tasking as written, one line each, such as
+/// "TaskingPayload[3]/Domain: is missing". Empty for a good one.
+std::vector<std::string> checkTasking(const plist::Value& tasking);
+
+}  // namespace tavrel

@@ -1,0 +1,218 @@
+#include "tools/log/log_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <memory>
+#include <ostream>
+#include <vector>
+
+#include "base/arithmetic.h"
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/plist/coding.h"
+#include "report/bh_report.h"
+#include "tools/log/filed_logs.h"
+#include "tools/log/log_document.h"
+#include "tools/log/log_faults.h"
+#include "tools/overlay/overlay_platform.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string file = "latest";
+  std::string day;
+  bool raw = false;
+  bool verbose = false;
+};
+
+std::string textIn(const plist::Dictionary& metadata, std::string_view key) {
+  return std::string(metadata.string(key).value_or("?"));
+}
+
+void list(ToolContext& context) {
+  const auto logs = filedLogs(context);
+  if (!logs) return context.fail(logs.error().message);
+  Table table({{"PLACE"}, {"FILED"}, {"TYPE"}, {"NAME"}, {"BYTES", Table::Align::Right}, {"FILE"}});
+  Json entries = Json::array();
+  for (const FiledLog& log : *logs) {
+    const auto& status = log.status;
+    const auto time = log.metadata.date(kLogMetadataTime);
+    if (context.json()) {
+      Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
+      entry["bytes"] = status ? Json(status->st_size) : Json(nullptr);
+      entries.push_back(std::move(entry));
+    } else {
+      table.add({std::string(nameOf(log.place)), time ? isoDateText(*time) : "?",
+                 textIn(log.metadata, kLogMetadataType), textIn(log.metadata, kLogMetadataName),
+                 status ? std::to_string(status->st_size) : "?", fileNameOf(log)});
+    }
+  }
+  if (context.json()) {
+    context.printJson({{"logs", std::move(entries)}});
+  } else if (!table.empty()) {
+    table.print(context.out(), context.columns());
+  }
+  noteMissingMetadata(context, *logs);
+}
+
+bool isDaily(const FiledLog& log) {
+  return log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName);
+}
+
+/// The log that `name` means: "latest" (of the daily logs), the name of a filed log, or a path of
+/// this machine.
+Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
+  const auto logs = filedLogs(context);
+  const bool isLatest = name == "latest";
+  if (!logs && isLatest) return logs.error();
+  if (logs) {
+    for (auto log = logs->rbegin(); log != logs->rend(); ++log) {
+      if ((isLatest && isDaily(*log)) || name == log->path || name == log->name ||
+          name == fileNameOf(*log)) {
+        return LogEnvelope{std::string(nameOf(log->place)), log->path, log->metadata};
+      }
+    }
+  }
+  if (isLatest) {
+    return Error{
+        "no log has been submitted: 'tavrelctl status' says whether submission is allowed, "
+        "'tavrelctl log preview' what a log would hold"};
+  }
+  return LogEnvelope{"file", name, {}};
+}
+
+// Logs of other services are texts of their own form.
+void showText(ToolContext& context, const LogEnvelope& envelope, std::string_view bytes) {
+  if (context.json()) {
+    Json log = jsonOfEnvelope(envelope);
+    log["text"] = bytes;
+    return context.printJson({{"log", std::move(log)}});
+  }
+  printEnvelope(context.out(), envelope);
+  context.out() << '\n';
+  while (!bytes.empty()) {
+    const std::size_t end = std::min(bytes.find('\n'), bytes.size());
+    context.out() << printable(bytes.substr(0, end)) << '\n';
+    bytes.remove_prefix(std::min(end + 1, bytes.size()));
+  }
+}
+
+void showDocument(ToolContext& context, const LogEnvelope& envelope,
+                  const plist::Dictionary& document) {
+  if (context.json()) return context.printJson({{"log", jsonOfLog(envelope, document)}});
+  printLog(context.out(), envelope, document, context.columns());
+}
+
+void show(ToolContext& context, const Arguments& arguments) {
+  const auto envelope = findLog(context, arguments.file);
+  if (!envelope) return context.fail(envelope.error().message);
+  const auto bytes =
+      context.linuxPlatform().fileSystem().read(envelope->path, limits::kPropertyListBytes);
+  if (!bytes) return context.fail(bytes.error().message);
+  if (arguments.raw) {
+    context.out() << *bytes;
+    return;
+  }
+  const auto value = plist::read(asBytes(*bytes));
+  if (value && !isTalliedLog(*value)) {
+    return context.fail(
+        format("not a tallied log: %s: 'tavrelctl plist show FILE' shows it", envelope->path));
+  }
+  if (value) return showDocument(context, *envelope, value->dictionary());
+  showText(context, *envelope, *bytes);
+}
+
+plist::Dictionary metadataOf(Platform& platform, const CapturedLog& log) {
+  plist::Dictionary metadata{{kLogMetadataType, log.type},
+                             {kLogMetadataName, log.name},
+                             {kLogMetadataVersion, platform.submission->ZTXOSVersion()}};
+  if (log.options) metadata.set(kLogMetadataOptions, log.options);
+  return metadata;
+}
+
+void preview(ToolContext& context, const Arguments& arguments) {
+  OverlayPlatform overlay(context.linuxPlatform());
+  Platform& platform = overlay.platform();
+  // A document that lacks something must not pass for the whole.
+  std::vector<std::string> errors;
+  overlay.setEventHandler([&](const OverlayEvent& event) {
+    if (event.kind != OverlayEvent::Kind::LogLine) return;
+    const std::string_view message = *event.value.string();
+    if (arguments.verbose) {
+      context.error() << event.subject << ": " << printable(message) << '\n';
+    } else if (event.subject == "error") {
+      errors.emplace_back(message);
+    }
+  });
+  const std::int32_t today = platform.statistics->BHDaysSince1970();
+  std::int32_t day = previousDay(today);
+  if (!arguments.day.empty()) {
+    const auto parsed = parseDay(arguments.day, today);
+    if (!parsed) return context.failUsage(parsed.error().message);
+    day = *parsed;
+  }
+
+  BHReport(platform).writeLogForYesterday(day, {});
+  if (overlay.logs().empty()) {
+    const std::string_view reason = overlay.lastError();
+    if (!errors.empty()) errors.pop_back();
+    for (const std::string& error : errors)
+      context.note(error);
+    return context.fail(
+        format("no log would be submitted for day %s: %s", dayText(day),
+               reason.empty() ? "no whitelisted key has a value on that day" : reason));
+  }
+  for (const std::string& error : errors)
+    context.note(error);
+  const CapturedLog& log = overlay.logs().back();
+  if (!context.json()) {
+    context.out() << log.bytes;
+    return;
+  }
+  const auto value = plist::read(asBytes(log.bytes));
+  if (!value) return context.fail(format("preview: %s", value.error().message));
+  showDocument(context, {"preview", "", metadataOf(platform, log)}, value->dictionary());
+}
+
+}  // namespace
+
+void addLogCommands(CLI::App& app, ToolContext& context) {
+  auto* group = app.add_subcommand("log", "Show submitted logs, and what would be submitted");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  auto* previewCommand = group->add_subcommand(
+      "preview",
+      "Print the document that a run would submit, permission given or not; changes nothing");
+  previewCommand
+      ->add_option("--day", arguments->day,
+                   "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
+      ->type_name("DAY");
+  previewCommand->add_flag("-v,--verbose", arguments->verbose,
+                           "Show what the run would write to the system log");
+  context.addJsonOption(*previewCommand);
+  previewCommand->callback([&context, arguments] { preview(context, *arguments); });
+
+  auto* listCommand = group->add_subcommand("list", "List the logs that were submitted");
+  context.addJsonOption(*listCommand);
+  listCommand->callback([&context] { list(context); });
+
+  auto* showCommand = group->add_subcommand("show", "Show a submitted log");
+  showCommand
+      ->add_option("FILE", arguments->file,
+                   "A log of 'log list', a path, or latest, the last daily one")
+      ->capture_default_str();
+  auto* raw = showCommand->add_flag("--raw", arguments->raw, "Print the log's bytes as they are");
+  context.addJsonOption(*showCommand);
+  raw->excludes("--json");
+  showCommand->callback([&context, arguments] { show(context, *arguments); });
+}
+
+}  // namespace tavrel

@@ -1,0 +1,10 @@
+// tavrelctl log
+#pragma once
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+void addLogCommands(CLI::App& app, ToolContext& context);
+
+}  // namespace tavrel

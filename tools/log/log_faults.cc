@@ -1,0 +1,89 @@
+#include "tools/log/log_faults.h"
+
+#include <algorithm>
+#include <iterator>
+#include <string_view>
+
+#include "base/format.h"
+#include "tools/shared/distribution_view.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Kind;
+
+struct Member {
+  std::string_view key;
+  Kind kind;  // null for any
+  std::string_view kindText;
+};
+
+constexpr Member kMembers[] = {
+    {"BHActivatedAppInfo", Kind::Array, "an array"},
+    {"BHCrashLogVersion", Kind::Number, "a number"},
+    {"BHDistributions", Kind::Dictionary, "a dictionary"},
+    {"BHDistributionsHistogram", Kind::Dictionary, "a dictionary"},
+    {"BHLogCreationDate", Kind::Date, "a date"},
+    {"BHMetadata", Kind::Dictionary, "a dictionary"},
+    {"BHScalars", Kind::Dictionary, "a dictionary"},
+    {"BHStartDate", Kind::Date, "a date"},
+    {"BHTaskDigest", Kind::Null, ""},
+    {"BHTaskID", Kind::Null, ""},
+    {"BHTasking", Kind::Array, "an array"},
+    {"BHWhitelistDigest", Kind::String, "a string"},
+};
+
+std::string notA(std::string_view path, const plist::Value& value, std::string_view wanted) {
+  return format("%s: is %s, not %s", path, kindWithArticle(value), wanted);
+}
+
+void checkHistogram(const plist::Dictionary& summaries, const plist::Entry& histogram,
+                    std::vector<std::string>& faults) {
+  const std::string path = format("BHDistributionsHistogram/%s", histogram.key);
+  if (!isSummary(summaries.get(histogram.key))) {
+    faults.push_back(path + ": belongs to no summary in BHDistributions");
+  }
+  const plist::Dictionary buckets = histogram.value.dictionary();
+  if (!buckets) faults.push_back(notA(path, histogram.value, "a dictionary"));
+  for (const plist::Entry& bucket : buckets) {
+    if (bucket.value.number()) continue;
+    faults.push_back(notA(format("%s/%s", path, bucket.key), bucket.value, "a number"));
+  }
+}
+
+}  // namespace
+
+bool isTalliedLog(const plist::Value& document) {
+  const plist::Dictionary log = document.dictionary();
+  return log.get("BHCrashLogVersion") || log.get("BHScalars") || log.get("BHDistributions");
+}
+
+std::vector<std::string> faultsOf(const plist::Dictionary& log) {
+  std::vector<std::string> faults;
+  for (const plist::Entry& entry : log) {
+    const auto* const member = std::find_if(std::begin(kMembers), std::end(kMembers),
+                                            [&](const Member& m) { return m.key == entry.key; });
+    if (member == std::end(kMembers)) {
+      faults.push_back(format("%s: is no part of a tallied log", entry.key));
+    } else if (member->kind != Kind::Null && member->kind != entry.value.kind()) {
+      faults.push_back(notA(entry.key, entry.value, member->kindText));
+    }
+  }
+  for (const plist::Entry& scalar : log.dictionary("BHScalars")) {
+    if (scalar.value.number()) continue;
+    faults.push_back(notA(format("BHScalars/%s", scalar.key), scalar.value, "a number"));
+  }
+  const plist::Dictionary summaries = log.dictionary("BHDistributions");
+  for (const plist::Entry& summary : summaries) {
+    if (isSummary(summary.value)) continue;
+    faults.push_back(format("BHDistributions/%s: is no summary of five numbers", summary.key));
+  }
+  for (const plist::Entry& histogram : log.dictionary("BHDistributionsHistogram")) {
+    checkHistogram(summaries, histogram, faults);
+  }
+  std::sort(faults.begin(), faults.end());
+  return faults;
+}
+
+}  // namespace tavrel

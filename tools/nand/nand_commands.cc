@@ -1,0 +1,248 @@
+#include "tools/nand/nand_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <ostream>
+#include <string>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/platform.h"
+#include "storage/counter_parsers.h"
+#include "storage/nand_exporters.h"
+#include "storage/nand_info.h"
+#include "storage/nand_info_keys.h"
+#include "storage/parse/asp_parser.h"
+#include "storage/vm_freezer.h"
+#include "tools/nand/nand_build.h"
+#include "tools/nand/nand_counters.h"
+#include "tools/nand/nand_snapshot.h"
+#include "tools/nand/nand_statistics.h"
+#include "tools/nand/nand_view.h"
+#include "tools/shared/input_file.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/noting_platform.h"
+#include "tools/shared/output_file.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string file;
+  std::string other;  // of --diff, --descriptor
+  std::string chipId;
+  std::string manufacturerId;
+  std::string output;
+};
+
+std::string nameOf(const std::string& file) {
+  return file == "-" ? "standard input" : file;
+}
+
+Expected<std::string> readBuffer(ToolContext& context, const std::string& file) {
+  return readInput(context, file, limits::kDeviceAllocationBytes);
+}
+
+void info(ToolContext& context) {
+  NotingPlatform noting(context);
+  const plist::Dictionary info = CopyNANDInfo(noting.platform());
+  const bool failed = info.contains(kNANDInfoErrorKey);
+  if (context.json()) {
+    context.printJson(jsonOf(info));
+  } else if (!failed) {
+    printNandInfo(context.out(), info, context.columns());
+  }
+  if (!failed) return;
+  const NandExporter* exporter = nullptr;
+  const bool hasDriver = findNandExporter(noting.platform().drivers, exporter) != nullptr;
+  const std::string advice = hasDriver
+                                 ? "see what the driver answers with 'tavrelctl registry show ID'"
+                                 : format("put a recording of the storage driver into %s",
+                                          context.root().path("/var/lib/tavrel/registry"));
+  context.fail(format("no NAND information: %s: %s",
+                      info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
+}
+
+// A buffer that cannot be parsed is a failure, but what it said until then is still worth showing.
+int parseInto(ToolContext& context, const std::string& file, std::string_view bytes,
+              ASPContext& statistics) {
+  const int result = ASPParseBufferToCxt(statistics, asBytes(bytes));
+  if (result == 0) {
+    const auto fault = faultOfStatistics(asBytes(bytes));
+    context.fail(format("%s is no whole statistics buffer: %s: fetch or build it anew",
+                        nameOf(file), fault ? *fault : "it has more values than can be listed"));
+  } else if (const std::size_t surplus = bytes.size() % 8; surplus != 0) {
+    context.note(format("%s: the last %zu bytes are no whole unit of 8 and were passed over",
+                        nameOf(file), surplus));
+  }
+  return result;
+}
+
+void parse(ToolContext& context, const Arguments& arguments) {
+  const auto bytes = readBuffer(context, arguments.file);
+  if (!bytes) return context.fail(bytes.error().message);
+  ASPContext statistics;
+  const int result = parseInto(context, arguments.file, *bytes, statistics);
+  if (context.json()) return context.printJson(jsonOfStatistics(result, statistics));
+  printStatistics(context.out(), statistics, context.columns());
+}
+
+void compare(ToolContext& context, const Arguments& arguments) {
+  const auto first = readBuffer(context, arguments.file);
+  if (!first) return context.fail(first.error().message);
+  const auto second = readBuffer(context, arguments.other);
+  if (!second) return context.fail(second.error().message);
+  ASPContext before, after;
+  const int firstResult = parseInto(context, arguments.file, *first, before);
+  const int secondResult = parseInto(context, arguments.other, *second, after);
+  const auto differences = differencesBetween(before, after);
+  if (context.json()) {
+    return context.printJson({{"results", {firstResult, secondResult}},
+                              {"differences", jsonOfDifferences(differences)}});
+  }
+  printDifferences(context.out(), differences, context.columns());
+}
+
+void counters(ToolContext& context, const Arguments& arguments) {
+  const auto bytes = readBuffer(context, arguments.file);
+  if (!bytes) return context.fail(bytes.error().message);
+  if (bytes->size() != kCounterBlockBytes) {
+    return context.fail(
+        format("%s is no counter block: it has %zu bytes, and a block has %zu: cut "
+               "one out with dd bs=%zu count=1 skip=CHANNEL",
+               nameOf(arguments.file), bytes->size(), kCounterBlockBytes, kCounterBlockBytes));
+  }
+  NotingStreams streams(context);
+  const ManufacturerId id = readManufacturerId(streams, arguments.manufacturerId);
+  const CounterParser parser =
+      selectCounterParser(chipGeneration(arguments.chipId), id.vendor, id.device);
+  TelemetryCounters record;
+  parser(asBytes(*bytes).first<kCounterBlockBytes>(), record);
+  const std::string_view name = counterParserName(parser);
+  if (context.json()) return context.printJson(jsonOfCounters(name, record));
+  printCounters(context.out(), name, record, context.columns());
+}
+
+void snapshot(ToolContext& context, const Arguments& arguments) {
+  const auto records = readBuffer(context, arguments.file);
+  if (!records) return context.fail(records.error().message);
+  std::string descriptor;
+  const bool hasDescriptor = !arguments.other.empty();
+  if (hasDescriptor) {
+    auto bytes = readBuffer(context, arguments.other);
+    if (!bytes) return context.fail(bytes.error().message);
+    descriptor = *std::move(bytes);
+  }
+  const auto text = renderSnapshots(
+      asBytes(*records), hasDescriptor ? std::optional(asBytes(descriptor)) : std::nullopt);
+  if (!text) {
+    return context.fail(format("cannot render %s: %s",
+                               nameOf(hasDescriptor ? arguments.other : arguments.file),
+                               text.error().message));
+  }
+  context.out() << *text;
+}
+
+void freezer(ToolContext& context, const Arguments& arguments) {
+  plist::Dictionary info;
+  if (arguments.file.empty()) {
+    NotingPlatform noting(context);
+    info = CopyVMFreezerNANDInfo(noting.platform().stackSnapshots);
+  } else {
+    const auto bytes = readBuffer(context, arguments.file);
+    if (!bytes) return context.fail(bytes.error().message);
+    TakenSnapshot taken(asBytes(*bytes));
+    info = CopyVMFreezerNANDInfo(taken);
+  }
+  const bool failed = info.contains(kNANDInfoVMFreezerErrorKey);
+  if (context.json()) {
+    context.printJson(jsonOf(info));
+  } else if (!failed) {
+    printNandInfo(context.out(), info, context.columns());
+  }
+  if (!failed) return;
+  std::string message(info.string(kNANDInfoVMFreezerErrorMessageKey).value_or(""));
+  if (message.ends_with('.')) message.pop_back();
+  if (!arguments.file.empty()) {
+    return context.fail(
+        format("%s: %s: give a stack snapshot whose first container holds the "
+               "thread VM_swapout",
+               nameOf(arguments.file), message));
+  }
+  context.fail(
+      format("no freezer writes: %s: put a stack snapshot that holds the thread "
+             "VM_swapout at %s",
+             message, context.root().path("/var/lib/tavrel/registry/stack-snapshot.bin")));
+}
+
+void build(ToolContext& context, const Arguments& arguments) {
+  const auto document = readDocument(context, arguments.file);
+  if (!document) return context.fail(document.error().message);
+  const auto bytes = buildStatistics(*document);
+  if (!bytes) {
+    return context.fail(format("%s: %s", nameOf(arguments.file), bytes.error().message));
+  }
+  const auto written = writeOutput(context, arguments.output, *bytes);
+  if (!written) context.fail(written.error().message);
+}
+
+}  // namespace
+
+void addNandCommands(CLI::App& app, ToolContext& context) {
+  auto* group = app.add_subcommand("nand", "Inspect the flash storage and its raw buffers");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+  const auto addFile = [&](CLI::App& command, const char* what) {
+    return command.add_option("FILE", arguments->file, what);
+  };
+
+  auto* infoCommand = group->add_subcommand("info", "Show the health of the flash");
+  context.addJsonOption(*infoCommand);
+  infoCommand->callback([&context] { info(context); });
+
+  auto* parseCommand = group->add_subcommand("parse", "Show every statistic of a raw buffer");
+  addFile(*parseCommand, "Statistics buffer; - is standard input")->required();
+  parseCommand->add_option("--diff", arguments->other, "Show what differs in this later buffer")
+      ->type_name("FILE2");
+  context.addJsonOption(*parseCommand);
+  parseCommand->callback([&context, arguments] {
+    arguments->other.empty() ? parse(context, *arguments) : compare(context, *arguments);
+  });
+
+  auto* countersCommand =
+      group->add_subcommand("counters", "Show the counters of a NAND chip's block");
+  addFile(*countersCommand, "Counter block of 4096 bytes; - is standard input")->required();
+  countersCommand->add_option("--chip-id", arguments->chipId, "The controller's, such as K3V")
+      ->required();
+  countersCommand
+      ->add_option("--manufacturer-id", arguments->manufacturerId,
+                   "The controller's, in hexadecimal digits")
+      ->required();
+  context.addJsonOption(*countersCommand);
+  countersCommand->callback([&context, arguments] { counters(context, *arguments); });
+
+  auto* snapshotCommand =
+      group->add_subcommand("snapshot", "Render the controller's timeline as text");
+  addFile(*snapshotCommand, "Snapshot records; - is standard input")->required();
+  snapshotCommand
+      ->add_option("--descriptor", arguments->other,
+                   "What describes the records (default: the fixed layout)")
+      ->type_name("FILE");
+  snapshotCommand->callback([&context, arguments] { snapshot(context, *arguments); });
+
+  auto* freezerCommand =
+      group->add_subcommand("freezer", "Show the flash writes of the memory freezer");
+  addFile(*freezerCommand, "Stack snapshot (default: the device's); - is standard input");
+  context.addJsonOption(*freezerCommand);
+  freezerCommand->callback([&context, arguments] { freezer(context, *arguments); });
+
+  auto* buildCommand = group->add_subcommand("build", "Make a statistics buffer from JSON");
+  addFile(*buildCommand, "Its entries, as nand parse --json prints them; - is standard input")
+      ->required();
+  buildCommand->add_option("-o,--output", arguments->output, "File to write; - is standard output")
+      ->required();
+  buildCommand->callback([&context, arguments] { build(context, *arguments); });
+}
+
+}  // namespace tavrel

@@ -1,0 +1,10 @@
+// `tavrelctl nand`: the NAND information, and the storage controller's raw buffers.
+#pragma once
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+void addNandCommands(CLI::App& app, ToolContext& context);
+
+}  // namespace tavrel

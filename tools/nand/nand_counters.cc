@@ -1,0 +1,63 @@
+#include "tools/nand/nand_counters.h"
+
+#include <algorithm>
+#include <ostream>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "base/format.h"
+#include "tools/shared/distribution_view.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kPerRow = 8;
+
+void printBins(std::ostream& out, std::span<const std::uint32_t> counters,
+               std::optional<std::size_t> columns) {
+  std::vector<DistributionView::Bucket> bars;
+  for (const std::uint32_t counter : counters)
+    bars.push_back({std::to_string(bars.size()), counter});
+  printBuckets(out, bars, columns);
+}
+
+// The number before a row is that of its first element.
+void printRows(std::ostream& out, std::span<const std::uint32_t> counters) {
+  Table table(std::vector<Table::Column>(1 + kPerRow, {"", Table::Align::Right}), 2);
+  for (std::size_t first = 0; first < counters.size(); first += kPerRow) {
+    std::vector<std::string> row{format("%zu:", first)};
+    for (std::size_t i = first; i < std::min(first + kPerRow, counters.size()); ++i)
+      row.push_back(std::to_string(counters[i]));
+    table.add(std::move(row));
+  }
+  table.print(out, std::nullopt);
+}
+
+}  // namespace
+
+Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters) {
+  Json arrays = Json::object();
+  for (const CounterArrayShape& shape : kCounterArrays)
+    arrays[std::string(shape.name)] = counters[shape.array];
+  return {{"parser", parser}, {"counters", std::move(arrays)}};
+}
+
+void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
+                   std::optional<std::size_t> columns) {
+  out << "Parser  " << parser << '\n';
+  for (const CounterArrayShape& shape : kCounterArrays) {
+    const auto array = counters[shape.array];
+    const bool isEmpty = std::all_of(array.begin(), array.end(), [](auto c) { return c == 0; });
+    out << format("\n%s (%zu)%s\n", shape.name, shape.size, isEmpty ? ": all 0" : "");
+    if (isEmpty) continue;
+    if (shape.name.ends_with("Bin")) {
+      printBins(out, array, columns);
+    } else {
+      printRows(out, array);
+    }
+  }
+}
+
+}  // namespace tavrel

@@ -1,0 +1,20 @@
+// The counters of a NAND chip for people and programs.
+#pragma once
+
+#include <iosfwd>
+#include <optional>
+#include <string_view>
+
+#include "storage/telemetry_counters.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// {"parser": …, "counters": {"readStage": […], …}}
+Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters);
+
+/// Error bins as bars, the other arrays in rows of eight; arrays of zeros on one line.
+void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
+                   std::optional<std::size_t> columns);
+
+}  // namespace tavrel

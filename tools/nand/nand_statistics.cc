@@ -1,0 +1,165 @@
+#include "tools/nand/nand_statistics.h"
+
+#include <algorithm>
+#include <ostream>
+#include <utility>
+
+#include "base/format.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::uint64_t kUnitBytes = 8;
+constexpr std::uint32_t kLargestValidKey = 0x30000000;
+
+struct Row {
+  std::string_view name;
+  std::uint64_t value;
+  std::size_t position;  // in the buffer
+};
+
+// By name; those of one name in the order of the buffer.
+std::vector<Row> sortedRows(const ASPContext& context) {
+  std::vector<Row> rows;
+  forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
+    rows.push_back({name, entry.value, rows.size()});
+  });
+  std::sort(rows.begin(), rows.end(), [](const Row& a, const Row& b) {
+    return std::tie(a.name, a.position) < std::tie(b.name, b.position);
+  });
+  return rows;
+}
+
+std::string changeText(const StatisticDifference& difference) {
+  if (!difference.before || !difference.after) return {};
+  const std::uint64_t before = *difference.before, after = *difference.after;
+  return after > before ? format("+%llu", after - before) : format("-%llu", before - after);
+}
+
+Json jsonOfChange(const StatisticDifference& difference) {
+  if (!difference.before || !difference.after) return nullptr;
+  const auto change = static_cast<std::int64_t>(*difference.after - *difference.before);
+  if ((change > 0) != (*difference.after > *difference.before)) return nullptr;
+  return change;
+}
+
+Json jsonOfValue(const std::optional<std::uint64_t>& value) {
+  return value ? Json(*value) : Json(nullptr);
+}
+
+std::string valueText(const std::optional<std::uint64_t>& value) {
+  return value ? std::to_string(*value) : "-";
+}
+
+}  // namespace
+
+Json jsonOfStatistics(int result, const ASPContext& context) {
+  Json entries = Json::array();
+  forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
+    entries.push_back(Json::array({name, entry.value}));
+  });
+  return {{"result", result},
+          {"fields",
+           {{"exportVersion", context.exportVersion},
+            {"driverVersion", context.driverVersion},
+            {"numVirtualBlocks", context.numVirtualBlocks},
+            {"blocksPerVirtualBlock", context.blocksPerVirtualBlock},
+            {"pagesPerVirtualBlock", context.pagesPerVirtualBlock},
+            {"bytesPerPage", context.bytesPerPage},
+            {"hostReads", context.hostReads},
+            {"hostWrites", context.hostWrites},
+            {"numFreeVirtualBlocks", context.numFreeVirtualBlocks},
+            {"wearLevMoves", context.wearLevMoves},
+            {"nandReads", context.nandReads},
+            {"nandWrites", context.nandWrites},
+            {"bandErases", context.bandErases},
+            {"IND_pool_free", context.IND_pool_free},
+            {"IND_pool_count", context.IND_pool_count},
+            {"utilFormatTime", context.utilFormatTime},
+            {"numSleepOps", context.numSleepOps},
+            {"maxHighEnduranceBlockErases", context.maxHighEnduranceBlockErases},
+            {"readCountHisto", context.readCountHisto}}},
+          {"entries", std::move(entries)}};
+}
+
+void printStatistics(std::ostream& out, const ASPContext& context,
+                     std::optional<std::size_t> columns) {
+  Table table({{"STATISTIC"}, {"VALUE", Table::Align::Right}});
+  forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
+    table.add({std::string(name), std::string(asText(entry.text))});
+  });
+  if (!table.empty()) table.print(out, columns);
+}
+
+std::optional<std::string> faultOfStatistics(ByteSpan buffer) {
+  const std::uint64_t end = buffer.size() / kUnitBytes * kUnitBytes;
+  if (end == 0) return format("it has %zu bytes, and a record has at least 8", buffer.size());
+  for (std::uint64_t at = 0; at < end;) {
+    const std::uint32_t key = *loadLittle32(buffer, at), count = *loadLittle32(buffer, at + 4);
+    if (key > kLargestValidKey) {
+      return format(
+          "the record at byte %llu: 0x%x is above 0x30000000, the largest number of a "
+          "statistic",
+          at, key);
+    }
+    at += kUnitBytes;
+    const std::uint64_t left = (end - at) / kUnitBytes;
+    if (count > left) {
+      return format("the record at byte %llu: statistic %u has %s, but there is room for %llu",
+                    at - kUnitBytes, key, counted(count, "value"), left);
+    }
+    at += count * kUnitBytes;
+  }
+  return std::nullopt;
+}
+
+std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
+                                                    const ASPContext& after) {
+  const std::vector<Row> first = sortedRows(before), second = sortedRows(after);
+  std::vector<std::pair<std::size_t, StatisticDifference>> found;
+  auto a = first.begin(), b = second.begin();
+  while (a != first.end() || b != second.end()) {
+    const int order = a == first.end() ? 1 : b == second.end() ? -1 : a->name.compare(b->name);
+    if (order < 0) {
+      found.push_back({a->position, {a->name, a->value, std::nullopt}});
+    } else if (order > 0) {
+      found.push_back({first.size() + b->position, {b->name, std::nullopt, b->value}});
+    } else if (a->value != b->value) {
+      found.push_back({a->position, {a->name, a->value, b->value}});
+    }
+    if (order <= 0) ++a;
+    if (order >= 0) ++b;
+  }
+  std::sort(found.begin(), found.end(),
+            [](const auto& x, const auto& y) { return x.first < y.first; });
+  std::vector<StatisticDifference> differences;
+  differences.reserve(found.size());
+  for (const auto& [position, difference] : found)
+    differences.push_back(difference);
+  return differences;
+}
+
+Json jsonOfDifferences(const std::vector<StatisticDifference>& differences) {
+  Json list = Json::array();
+  for (const StatisticDifference& difference : differences) {
+    list.push_back({{"statistic", difference.name},
+                    {"before", jsonOfValue(difference.before)},
+                    {"after", jsonOfValue(difference.after)},
+                    {"change", jsonOfChange(difference)}});
+  }
+  return list;
+}
+
+void printDifferences(std::ostream& out, const std::vector<StatisticDifference>& differences,
+                      std::optional<std::size_t> columns) {
+  constexpr auto kRight = Table::Align::Right;
+  Table table({{"STATISTIC"}, {"BEFORE", kRight}, {"AFTER", kRight}, {"CHANGE", kRight}});
+  for (const StatisticDifference& difference : differences) {
+    table.add({std::string(difference.name), valueText(difference.before),
+               valueText(difference.after), changeText(difference)});
+  }
+  if (!table.empty()) table.print(out, columns);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,47 @@
+// A parsed statistics buffer for people and programs, and what differs between two of them.
+#pragma once
+
+#include <cstdint>
+#include <iosfwd>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/bytes.h"
+#include "storage/parse/asp_context.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// {"result": …, "fields": {…}, "entries": [[name, value], …]}
+Json jsonOfStatistics(int result, const ASPContext& context);
+
+/// One line a statistic, in the order of the buffer.
+void printStatistics(std::ostream& out, const ASPContext& context,
+                     std::optional<std::size_t> columns);
+
+/// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for one that can.
+std::optional<std::string> faultOfStatistics(ByteSpan buffer);
+
+/// A statistic whose value differs, or that only one of two buffers has. The name is borrowed from
+/// a context.
+struct StatisticDifference {
+  std::string_view name;
+  std::optional<std::uint64_t> before;
+  std::optional<std::uint64_t> after;
+};
+
+/// In the order of the first buffer, then what only the second has. A name that stands several
+/// times in a buffer is compared first with first, second with second.
+std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
+                                                    const ASPContext& after);
+
+/// [{"statistic": …, "before": …, "after": …, "change": …}]; what is not there, and a change of
+/// more than 63 bits, is null.
+Json jsonOfDifferences(const std::vector<StatisticDifference>& differences);
+
+void printDifferences(std::ostream& out, const std::vector<StatisticDifference>& differences,
+                      std::optional<std::size_t> columns);
+
+}  // namespace tavrel

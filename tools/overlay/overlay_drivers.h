@@ -1,0 +1,27 @@
+// A driver registry whose use is told.
+#pragma once
+
+#include <memory>
+
+#include "platform/driver_registry.h"
+#include "tools/overlay/overlay_events.h"
+
+namespace tavrel {
+
+/// Services and connections go through to `below`: recorded drivers change nothing on disk. What it
+/// gives out may outlive neither `below` nor `events`.
+class OverlayDrivers final : public DriverRegistry {
+ public:
+  OverlayDrivers(DriverRegistry& below, const OverlayEvents& events)
+      : below_(below), events_(events) {}
+
+  std::shared_ptr<DriverService> firstService(std::string_view className) override;
+  KernelReturn matchingServices(const plist::Dictionary& matching,
+                                std::unique_ptr<ServiceIterator>& services) override;
+
+ private:
+  DriverRegistry& below_;
+  const OverlayEvents& events_;
+};
+
+}  // namespace tavrel

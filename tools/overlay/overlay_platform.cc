@@ -1,0 +1,111 @@
+#include "tools/overlay/overlay_platform.h"
+
+#include <cerrno>
+#include <fcntl.h>
+#include <utility>
+
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_crash_reporting.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/process/linux_clock.h"
+#include "platform/plist/coding.h"
+#include "tools/overlay/overlay_drivers.h"
+#include "tools/overlay/overlay_reads.h"
+
+namespace tavrel {
+namespace {
+
+// What is below an overlay could not change a file if it tried.
+class ReadOnlyFileSystem final : public FileSystem {
+ protected:
+  int openFile(const char* path, int flags, mode_t mode) override {
+    const bool isReading = (flags & (O_ACCMODE | O_CREAT)) == O_RDONLY;
+    return isReading ? FileSystem::openFile(path, flags, mode) : refuse();
+  }
+  int truncateFile(int, off_t) override { return refuse(); }
+  int renameFile(const char*, const char*) override { return refuse(); }
+  int removeFile(const char*) override { return refuse(); }
+  int makeFolder(const char*, mode_t) override { return refuse(); }
+
+ private:
+  static int refuse() {
+    errno = EROFS;
+    return -1;
+  }
+};
+
+}  // namespace
+
+// A platform of its own below, so that what its services have to say goes to the overlay too.
+struct OverlayPlatform::Services {
+  explicit Services(LinuxPlatform& device) : root(device.root()) {
+    platform.applications = applications;
+    platform.crashReporting = crashReporting;
+    platform.deviceAnswers = answers;
+    platform.drivers = drivers;
+    platform.dynamicLoader = loader;
+    platform.files = files;
+    platform.locale = locale;
+    platform.notifications = notifications;
+    platform.preferences = preferences;
+    platform.standardStreams = streams;
+    platform.statistics = store;
+    platform.submission = submission;
+    platform.systemControls = systemControls;
+    platform.systemVersion = systemVersion;
+  }
+
+  const DeviceRoot& root;
+  OverlayEvents events;
+  OverlayLog log{events};
+  ReadOnlyFileSystem fileSystem;
+  LinuxClock clock;
+  plist::PlistCoding propertyLists;
+  FilePreferences filePreferences{root, fileSystem, propertyLists, clock, log};
+  OverlayPreferences preferences{filePreferences, events};
+  LinuxPlatform below{
+      root,
+      {.log = &log, .fileSystem = &fileSystem, .preferences = &preferences, .readOnly = true}};
+  Platform platform = below.platform();
+
+  OverlayApplications applications{platform.applications, events};
+  OverlayCrashReporting crashReporting{below.crashReporting(), events};
+  OverlayAnswers answers{platform.deviceAnswers, events};
+  OverlayDrivers drivers{platform.drivers, events};
+  OverlayLoader loader{platform.dynamicLoader, preferences, events};
+  OverlayFileReader files{platform.files, events};
+  OverlayLocale locale{platform.locale, events};
+  OverlayNotifications notifications{events};
+  OverlayStreams streams{events};
+  OverlayStore store{platform.statistics, events};
+  OverlaySubmission submission{platform.submission, events};
+  OverlayControls systemControls{platform.systemControls, events};
+  OverlaySystemVersion systemVersion{platform.systemVersion, events};
+};
+
+OverlayPlatform::OverlayPlatform(LinuxPlatform& below)
+    : services_(std::make_unique<Services>(below)) {}
+OverlayPlatform::~OverlayPlatform() = default;
+
+Platform& OverlayPlatform::platform() {
+  return services_->platform;
+}
+
+void OverlayPlatform::setEventHandler(OverlayEvents::Handler handler) {
+  services_->events.setHandler(std::move(handler));
+}
+
+void OverlayPlatform::replaceFile(std::string path, std::string content) {
+  services_->files.replaced[std::move(path)] = std::move(content);
+}
+
+const std::vector<CapturedLog>& OverlayPlatform::logs() const {
+  return services_->submission.logs;
+}
+
+std::string_view OverlayPlatform::lastError() const {
+  return services_->log.lastError;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,49 @@
+// A platform that changes nothing: reads go through to the device, writes stay in memory.
+//
+// With it the daemon's own code shows what a run would do:
+//
+//   OverlayPlatform overlay(context.linuxPlatform());
+//   BHReport(overlay.platform()).writeLogForYesterday(day, {});
+//   for (const CapturedLog& log : overlay.logs()) ...
+//
+// The platform below must outlive it.
+#pragma once
+
+#include <memory>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/platform.h"
+#include "tools/overlay/overlay_events.h"
+#include "tools/overlay/overlay_writes.h"
+
+namespace tavrel {
+
+class LinuxPlatform;
+
+class OverlayPlatform {
+ public:
+  explicit OverlayPlatform(LinuxPlatform& below);
+  ~OverlayPlatform();
+  OverlayPlatform(const OverlayPlatform&) = delete;
+  OverlayPlatform& operator=(const OverlayPlatform&) = delete;
+
+  Platform& platform();
+
+  /// Called for everything that is read, would be written, or is said, as it happens. The handler
+  /// must not use the platform.
+  void setEventHandler(OverlayEvents::Handler handler);
+  /// Makes `content` the content of the device's file at `path`.
+  void replaceFile(std::string path, std::string content);
+
+  const std::vector<CapturedLog>& logs() const;
+  /// The last entry at error level, empty when there was none.
+  std::string_view lastError() const;
+
+ private:
+  struct Services;
+  std::unique_ptr<Services> services_;
+};
+
+}  // namespace tavrel

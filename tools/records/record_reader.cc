@@ -1,0 +1,100 @@
+#include "tools/records/record_reader.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <fcntl.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/system_error.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kBlockBytes = 64U << 10;
+
+}  // namespace
+
+Status RecordReader::read(bool takesRest, const LineHandler& handler) {
+  const Descriptor file(open(path_.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0) return systemError("read", path_);
+  if (!S_ISREG(status.st_mode)) return Error{"cannot read " + path_ + ": it is no regular file"};
+  if (status.st_size < offset_) {
+    offset_ = 0;
+    lines_ = 0;
+    rest_.clear();
+  }
+  for (;;) {
+    const std::size_t kept = rest_.size();
+    if (kept > limits::kStructuredRecordFileBytes) {
+      return Error{
+          format("cannot read %s: line %llu is too long; move the file away", path_, lines_ + 1)};
+    }
+    rest_.resize(kept + kBlockBytes);
+    const ssize_t got = pread(file.get(), rest_.data() + kept, kBlockBytes, offset_);
+    rest_.resize(kept + static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return systemError("read", path_);
+    if (got == 0) break;
+    offset_ += got;
+
+    std::size_t begin = 0;
+    std::size_t searched = kept;  // what was kept has no line end
+    for (std::size_t end; (end = rest_.find('\n', searched)) != std::string::npos;) {
+      handler(std::string_view(rest_).substr(begin, end - begin), ++lines_);
+      begin = searched = end + 1;
+    }
+    rest_.erase(0, begin);
+  }
+  if (takesRest && !rest_.empty()) handler(std::exchange(rest_, {}), ++lines_);
+  return Done{};
+}
+
+Expected<StructuredRecord> parseRecord(std::string_view line) {
+  const auto value = parseJsonValue(line);
+  if (!value) return value.error();
+  const plist::Dictionary object = value->dictionary();
+  const auto time = object.string("time");
+  const auto type = object.number("type");
+  const plist::Dictionary content = object.dictionary("record");
+  if (!time || !type || !content) {
+    return Error{"no object with \"time\", \"type\" and \"record\""};
+  }
+  return StructuredRecord{std::string(*time), *type, content};
+}
+
+std::string recordText(const plist::Dictionary& record) {
+  std::string text;
+  std::string list;  // the name of the list that is open
+  std::size_t next = 0;
+  const auto closeList = [&] {
+    if (!list.empty()) text += ']';
+    list.clear();
+  };
+  for (const plist::Entry& entry : record) {
+    const std::string_view key = entry.key;
+    if (!list.empty() && key == format("%s[%zu]", list, next)) {
+      text += ',';
+      ++next;
+    } else {
+      closeList();
+      if (!text.empty()) text += ' ';
+      const bool beginsList = key.size() > 3 && key.ends_with("[0]");
+      text += beginsList ? key.substr(0, key.size() - 3) : key;
+      text += beginsList ? "=[" : "=";
+      if (beginsList) list = key.substr(0, key.size() - 3);
+      next = 1;
+    }
+    text += inlineText(entry.value);
+  }
+  closeList();
+  return text;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,33 @@
+// A daily run that changes nothing, as the steps that it takes.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "tools/overlay/overlay_events.h"
+
+namespace tavrel {
+
+class LinuxPlatform;
+
+enum class RehearsedRun : std::uint8_t {
+  Gated,   // yesterday, unless it is done
+  Forced,  // yesterday in any case
+  Today,   // today
+};
+
+struct RehearsedStep {
+  std::string title;
+  std::vector<OverlayEvent> events;  // never empty
+};
+
+struct Rehearsal {
+  std::int32_t day;
+  std::vector<RehearsedStep> steps;
+};
+
+/// Plays the daemon's own run over the device.
+Rehearsal rehearse(LinuxPlatform& device, RehearsedRun run);
+
+}  // namespace tavrel

@@ -1,0 +1,161 @@
+#include "tools/report/registry_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "base/format.h"
+#include "ioreport/keys.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/recorded/recorded_registry.h"
+#include "platform/linux/recorded/recording.h"
+#include "platform/linux/recorded/typed_fields.h"
+#include "platform/plist/xml.h"
+#include "platform/report_protocol.h"
+#include "tools/report/report_selection.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/output_file.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string id;
+  std::string file;
+};
+
+// What could be read. When that is not all, notes have said why, and the exit status is 1.
+struct CurrentRecording {
+  plist::Dictionary content;
+  bool isWhole;
+};
+
+CurrentRecording currentRecording(ToolContext& context) {
+  const plist::Dictionary content = context.linuxPlatform().registry().recording();
+  if (context.hasComplaints()) context.setExitStatus(kExitFailure);
+  return {content, !context.hasComplaints()};
+}
+
+// The services of a recording, the hub last.
+std::vector<plist::Dictionary> servicesOf(const plist::Dictionary& recording) {
+  std::vector<plist::Dictionary> services;
+  for (const plist::Value& service : recording.array("Services")) {
+    if (service.dictionary().string("Class")) services.push_back(service.dictionary());
+  }
+  if (const plist::Dictionary hub = recording.dictionary("Hub")) {
+    plist::Dictionary service = plist::mutableCopy(hub);
+    service.set("Class", kReportHubClass);
+    services.push_back(service);
+  }
+  return services;
+}
+
+std::size_t channelCount(const plist::Dictionary& service) {
+  std::size_t count = 0;
+  for (const plist::Value& group : service.dictionary("Properties").array(kLegendKey))
+    count += group.dictionary().array(kChannelsKey).size();
+  return count;
+}
+
+void list(ToolContext& context, const Arguments&) {
+  Table table({{"ID", Table::Align::Right},
+               {"CLASS"},
+               {"NAME"},
+               {"PUBLIC"},
+               {"CHANNELS", Table::Align::Right},
+               {"METHODS", Table::Align::Right}});
+  Json services = Json::array();
+  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
+    const auto id = wordOf(service.get("EntryID"));
+    const std::string_view className = *service.string("Class");
+    const std::string_view name = service.string("Name").value_or(className);
+    const bool isPublic =
+        service.dictionary("Properties").boolean(kLegendPublicKey).value_or(false);
+    const std::size_t methods = service.array("Methods").size();
+    if (context.json()) {
+      services.push_back({{"id", id ? Json(*id) : Json()},
+                          {"class", className},
+                          {"name", name},
+                          {"public", isPublic},
+                          {"channels", channelCount(service)},
+                          {"methods", methods}});
+    } else {
+      table.add({id ? std::to_string(*id) : "-", std::string(className), std::string(name),
+                 isPublic ? "yes" : "no", std::to_string(channelCount(service)),
+                 std::to_string(methods)});
+    }
+  }
+  if (context.json()) return context.printJson({{"services", std::move(services)}});
+  if (table.empty())
+    return context.note("no drivers: recordings of them belong in " +
+                        context.root().path("/var/lib/tavrel/registry"));
+  table.print(context.out(), context.columns());
+}
+
+void show(ToolContext& context, const Arguments& arguments) {
+  const auto id = parseWord(arguments.id);
+  if (!id) {
+    return context.failUsage(
+        format("not an entry id: %s: give a 64-bit number, decimal or with 0x", arguments.id));
+  }
+  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
+    if (wordOf(service.get("EntryID")) != *id) continue;
+    if (context.json()) return context.printJson({{"service", jsonOf(service)}});
+    return printOutline(context.out(), service);
+  }
+  context.fail(
+      format("no service has entry id %llu: 'tavrelctl registry list' shows what there is", *id));
+}
+
+void record(ToolContext& context, const Arguments& arguments) {
+  const auto [recording, isWhole] = currentRecording(context);
+  if (!isWhole) {
+    return context.fail(
+        format("nothing is written to %s: mend or remove what could not be read", arguments.file));
+  }
+  const auto document = plist::writeXml(recording);
+  if (!document) {
+    return context.fail(
+        format("cannot write %s: %s", arguments.file, std::string_view(document.error().message)));
+  }
+  if (const Status written = writeOutput(context, arguments.file, *document); !written) {
+    context.fail(written.error().message);
+  }
+}
+
+CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  CLI::App* const command = group.add_subcommand(name, description);
+  command->callback([&context, arguments, action] { action(context, *arguments); });
+  return *command;
+}
+
+}  // namespace
+
+void addRegistryCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* const group = app.add_subcommand("registry", "Services of the recorded drivers");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  context.addJsonOption(addCommand(*group, "list", "List the services", arguments, context, list));
+
+  CLI::App& shown =
+      addCommand(*group, "show", "Show everything of one service", arguments, context, show);
+  shown.add_option("ID", arguments->id, "Its entry id, decimal or with 0x")->required();
+  context.addJsonOption(shown);
+
+  CLI::App& recorded =
+      addCommand(*group, "record", "Write all recordings as one", arguments, context, record);
+  recorded
+      .add_option("FILE", arguments->file,
+                  "Property list to write, in one step; - is standard output")
+      ->required();
+}
+
+}  // namespace tavrel

@@ -1,0 +1,10 @@
+// tavrelctl registry: the services of the recorded drivers.
+#pragma once
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+void addRegistryCommands(CLI::App& app, ToolContext& context);
+
+}  // namespace tavrel

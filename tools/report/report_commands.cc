@@ -1,0 +1,261 @@
+#include "tools/report/report_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <algorithm>
+#include <charconv>
+#include <chrono>
+#include <memory>
+#include <ostream>
+#include <string_view>
+#include <thread>
+#include <utility>
+
+#include "base/format.h"
+#include "ioreport/ioreport.h"
+#include "tools/report/report_delta.h"
+#include "tools/report/report_json.h"
+#include "tools/report/report_selection.h"
+#include "tools/report/report_view.h"
+#include "tools/shared/noting_platform.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr double kLongestInterval = 86'400;  // seconds
+
+constexpr std::string_view kNoHub =
+    "there is no hub: a recording in /var/lib/tavrel/registry must have a \"Hub\"";
+
+struct Arguments {
+  ReportSelection selection;
+  bool flat = false;
+  double interval = 1;
+  std::uint32_t count = 1;
+  bool delta = false;
+  bool channelsOnly = false;
+};
+
+Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
+                                             const ReportSelection& selection) {
+  auto channels = selectChannels(noting.platform(), selection);
+  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
+  // Of a driver whose channels cannot be read the notes have the library's words only.
+  if (channels && noting.hasPrinted()) {
+    context.note("such drivers are left out: 'tavrelctl registry show ID' shows what they publish");
+  }
+  return channels;
+}
+
+// The selected channels and the connection that samples them.
+class Sampler {
+ public:
+  /// Says what is wrong when it cannot subscribe.
+  Sampler(ToolContext& context, const ReportSelection& selection)
+      : context_(context), noting_(context) {
+    const auto selected = selectedChannels(context, noting_, selection);
+    if (!selected) {
+      context.fail(selected.error().message);
+      return;
+    }
+    if (IOReportGetChannelCount(*selected) == 0) {
+      context.fail("no such channel is published: 'tavrelctl report list' shows what there is");
+      return;
+    }
+    std::optional<ErrorObject> error;
+    subscription_ = IOReportCreateSubscription(noting_.platform().drivers, nullptr, *selected,
+                                               &subscribed_, 0, &error);
+    if (subscription_) return;
+    const bool isHubMissing = error && error->code == kKernelNotFound && !reasonOf(error);
+    context.fail(
+        reportFailure("subscribe to the channels", error, isHubMissing ? kNoHub : kLookAtDrivers));
+  }
+
+  explicit operator bool() const { return subscription_ != nullptr; }
+
+  /// An empty handle after having said why.
+  plist::Dictionary sample() {
+    std::optional<ErrorObject> error;
+    auto samples = IOReportCreateSamples(subscription_.get(), subscribed_, &error);
+    if (!samples) context_.fail(reportFailure("sample the channels", error));
+    return samples;
+  }
+
+  /// Subscribed channels that have no values.
+  std::int32_t missing(const plist::Dictionary& samples) const {
+    return IOReportGetChannelCount(subscribed_) - IOReportGetChannelCount(samples);
+  }
+
+ private:
+  ToolContext& context_;
+  NotingPlatform noting_;
+  plist::Dictionary subscribed_;
+  std::shared_ptr<IOReportSubscription> subscription_;
+};
+
+void list(ToolContext& context, const Arguments& arguments) {
+  NotingPlatform noting(context);
+  const auto channels = selectedChannels(context, noting, arguments.selection);
+  if (!channels) return context.fail(channels.error().message);
+  if (context.json()) {
+    JsonList list(context.out(), Json::object(), "channels");
+    addChannels(list, *channels);
+    return list.end();
+  }
+  if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
+  printChannels(context.out(), *channels, arguments.flat, context.columns());
+}
+
+void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
+              std::uint32_t number, std::int32_t missing) {
+  if (context.json()) {
+    // Of several each is one line, so that readers can tell where one ends.
+    JsonList list(
+        context.out(), {{"sample", number}, {"delta", arguments.delta}, {"missing", missing}},
+        "channels", arguments.count == 1 ? JsonList::Layout::Document : JsonList::Layout::Line);
+    addSamples(list, samples, arguments.delta);
+    list.end();
+  } else {
+    if (number > 1) context.out() << '\n';
+    if (arguments.count > 1) {
+      const char* const what = arguments.delta ? "Change" : "Sample";
+      context.out() << format("%s %u of %u\n", what, number, arguments.count);
+    }
+    printSamples(context.out(), samples, arguments.delta, context.columns());
+  }
+  context.out().flush();
+}
+
+// Deltas, without the channels that have none. A note names the first of them whenever their number
+// changes.
+class Changes {
+ public:
+  explicit Changes(ToolContext& context) : context_(context) {}
+
+  plist::Dictionary between(const plist::Dictionary& previous, const plist::Dictionary& current) {
+    PartialDelta delta;
+    delta.samples = IOReportCreateSamplesDelta(previous, current, nullptr);
+    if (!delta.samples) delta = subtractEach(previous, current);
+    if (delta.leftOut != std::exchange(leftOut_, delta.leftOut) && delta.leftOut > 0) {
+      context_.note(format("%s without a change that can be told, left out; the first is %s",
+                           counted(delta.leftOut, "channel"), delta.firstLeftOut));
+    }
+    return delta.samples;
+  }
+
+ private:
+  ToolContext& context_;
+  std::size_t leftOut_ = 0;
+};
+
+void sample(ToolContext& context, const Arguments& arguments) {
+  Sampler sampler(context, arguments.selection);
+  if (!sampler) return;
+  const std::chrono::duration<double> interval(arguments.interval);
+  plist::Dictionary previous;
+  Changes changes(context);
+  std::int32_t reported = 0;
+  for (std::uint32_t number = arguments.delta ? 0 : 1; number <= arguments.count; ++number) {
+    if (number > (arguments.delta ? 0U : 1U)) std::this_thread::sleep_for(interval);
+    const plist::Dictionary samples = sampler.sample();
+    if (!samples) return;
+    const std::int32_t missing = sampler.missing(samples);
+    if (missing != reported) {
+      context.note(format("%s without values: the hub does not know them",
+                          counted(static_cast<std::uint64_t>(missing), "channel")));
+      reported = missing;
+    }
+    const plist::Dictionary shown = previous ? changes.between(previous, samples) : samples;
+    if (number > 0) printOne(context, arguments, shown, number, missing);
+    if (!context.out()) return;
+    if (arguments.delta) previous = samples;
+  }
+}
+
+// The system's own words. Some of them have no line end.
+void print(ToolContext& context, const std::optional<std::string>& description) {
+  if (!description) return;
+  // Names come from drivers: what would steer a terminal is shown, but not the lines' own ends.
+  std::string_view rest = *description;
+  while (!rest.empty()) {
+    const std::size_t end = std::min(rest.find('\n'), rest.size());
+    context.out() << printable(rest.substr(0, end)) << '\n';
+    rest.remove_prefix(std::min(end + 1, rest.size()));
+  }
+}
+
+void describe(ToolContext& context, const Arguments& arguments) {
+  if (arguments.channelsOnly) {
+    NotingPlatform noting(context);
+    const auto channels = selectedChannels(context, noting, arguments.selection);
+    if (!channels) return context.fail(channels.error().message);
+    for (const plist::Dictionary& channel : channelsIn(*channels))
+      print(context, IOReportChannelCopyDescription(channel, 0, nullptr));
+    return;
+  }
+  Sampler sampler(context, arguments.selection);
+  if (!sampler) return;
+  const plist::Dictionary samples = sampler.sample();
+  for (const plist::Dictionary& channel : channelsIn(samples)) {
+    print(context, IOReportChannelCopyDescription(channel, 0, nullptr));
+    const auto description = IOReportSampleCopyDescription(channel, 0, "  ");
+    print(context, description ? description : "  (no description)");
+  }
+}
+
+// What is wrong with the text of an option; nothing when it is good.
+
+std::string secondsFault(const std::string& text) {
+  double seconds = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), seconds);
+  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
+  if (isNumber && seconds >= 0 && seconds <= kLongestInterval) return {};
+  return format("not a number of seconds: %s: give 0 to 86400, such as 0.5", text);
+}
+
+std::string countFault(const std::string& text) {
+  std::uint32_t count = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), count);
+  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
+  if (isNumber && count > 0) return {};
+  return format("not a number of samples: %s: give 1 or more", text);
+}
+
+CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  CLI::App* const command = group.add_subcommand(name, description);
+  command->callback([&context, arguments, action] { action(context, *arguments); });
+  addSelectionOptions(*command, arguments->selection);
+  return *command;
+}
+
+}  // namespace
+
+void addReportCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* const group = app.add_subcommand("report", "Report channels that drivers publish");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  CLI::App& listed = addCommand(*group, "list", "List channels by driver, group and subgroup",
+                                arguments, context, list);
+  listed.add_flag("--flat", arguments->flat, "A table, one line a channel");
+  context.addJsonOption(listed);
+
+  CLI::App& sampled =
+      addCommand(*group, "sample", "Show the values of channels", arguments, context, sample);
+  sampled.add_option("--interval", arguments->interval, "Seconds between samples (default 1)")
+      ->type_name("S")
+      ->check(secondsFault);
+  sampled.add_option("--count", arguments->count, "How many samples (default 1)")
+      ->type_name("N")
+      ->check(countFault);
+  sampled.add_flag("--delta", arguments->delta, "Show what changed since the sample before");
+  context.addJsonOption(sampled);
+
+  CLI::App& described = addCommand(*group, "describe", "Print the system's own descriptions",
+                                   arguments, context, describe);
+  described.add_flag("--channels", arguments->channelsOnly, "Of the channels only, not of values");
+}
+
+}  // namespace tavrel

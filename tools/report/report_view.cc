@@ -1,0 +1,274 @@
+#include "tools/report/report_view.h"
+
+#include <algorithm>
+#include <cmath>
+#include <ostream>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "base/format.h"
+#include "ioreport/elements.h"
+#include "ioreport/ioreport.h"
+#include "ioreport/state_values.h"
+#include "tools/report/report_selection.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kBarWidth = 24;
+constexpr std::uint64_t kBarSteps = 1000;  // of a whole
+
+std::string textOr(std::optional<std::string_view> text, std::string_view otherwise) {
+  return std::string(text.value_or(otherwise));
+}
+
+std::string nameOf(const plist::Dictionary& channel) {
+  if (const auto name = IOReportChannelGetChannelName(channel)) return std::string(*name);
+  return format("%#llx", IOReportChannelGetChannelID(channel));
+}
+
+// "Power state (24Mticks)", or the name alone without a unit.
+std::string titleOf(const plist::Dictionary& channel) {
+  const std::string label = textOr(IOReportChannelGetUnitLabel(channel), "");
+  return label.empty() ? nameOf(channel) : format("%s (%s)", nameOf(channel), label);
+}
+
+std::string signedText(std::int64_t value) {
+  return value == kInvalidValue ? "-" : std::to_string(value);
+}
+
+// A count, which is unsigned but as a difference.
+std::string countText(std::int64_t value, bool isDelta) {
+  if (value == kInvalidValue || isDelta) return signedText(value);
+  return std::to_string(static_cast<std::uint64_t>(value));
+}
+
+// Says when another driver, group or subgroup begins.
+class Place {
+ public:
+  explicit Place(const plist::Dictionary& channel)
+      : names_{textOr(IOReportChannelGetDriverName(channel), "?"),
+               textOr(IOReportChannelGetGroup(channel), ""),
+               textOr(IOReportChannelGetSubGroup(channel), "")} {}
+  Place() = default;
+  bool operator==(const Place&) const = default;
+
+  /// Calls back with depth and name of each level that is not that of `earlier`.
+  template <class Callback>
+  void forNew(const Place& earlier, const Callback& callback) const {
+    bool isNew = false;
+    for (std::size_t depth = 0; depth < std::size(names_); ++depth) {
+      isNew = isNew || names_[depth] != earlier.names_[depth];
+      if (isNew && !names_[depth].empty()) callback(depth, names_[depth]);
+    }
+  }
+  /// How many levels the channel lies below.
+  std::size_t depth() const { return names_[1].empty() ? 1 : names_[2].empty() ? 2 : 3; }
+
+ private:
+  std::string names_[3];
+};
+
+std::vector<std::string> cellsOf(const plist::Dictionary& channel) {
+  std::uint64_t type = 0;
+  const bool hasType = getChannelType(channel, type) == kKernelSuccess;
+  return {formatName(IOReportChannelGetFormat(channel)),
+          textOr(IOReportChannelGetUnitLabel(channel), ""),
+          format("0x%04x", IOReportChannelGetCategories(channel)),
+          hasType ? std::to_string(elementCountOf(type)) : "-",
+          format("%#llx", IOReportChannelGetChannelID(channel))};
+}
+
+// Prints samples: simple channels in a table for each group, others in blocks of their own.
+class SamplePrinter {
+ public:
+  SamplePrinter(std::ostream& out, bool isDelta, std::optional<std::size_t> columns)
+      : out_(out), isDelta_(isDelta), columns_(columns) {}
+
+  void print(const plist::Dictionary& channel) {
+    Place place(channel);
+    if (place != place_) {
+      flush();
+      place.forNew(place_, [&](std::size_t depth, const std::string& name) {
+        if (depth == 0 && place_ != Place()) out_ << '\n';
+        out_ << std::string(2 * depth, ' ') << printable(name) << '\n';
+      });
+      place_ = std::move(place);
+    }
+    switch (IOReportChannelGetFormat(channel)) {
+      case kFormatSimple:
+        simple_.push_back({nameOf(channel), signedText(IOReportSimpleGetIntegerValue(channel)),
+                           textOr(IOReportChannelGetUnitLabel(channel), "")});
+        return;
+      case kFormatState:
+        return printStates(channel);
+      case kFormatHistogram:
+        return printHistogram(channel);
+      case kFormatSimpleArray:
+        return printArray(channel);
+      default:
+        simple_.push_back({nameOf(channel), "-", "of unknown format"});
+    }
+  }
+
+  void flush() {
+    printTable({{""}, {"", Table::Align::Right}, {""}}, std::exchange(simple_, {}), indent());
+  }
+
+ private:
+  using Rows = std::vector<std::vector<std::string>>;
+
+  std::size_t indent() const { return 2 * place_.depth(); }
+
+  void printTable(std::vector<Table::Column> columns, Rows rows, std::size_t indent) {
+    if (rows.empty()) return;
+    Table table(std::move(columns), indent);
+    for (auto& row : rows)
+      table.add(std::move(row));
+    table.print(out_, columns_);
+  }
+
+  void printBlock(const plist::Dictionary& channel, std::vector<Table::Column> columns, Rows rows) {
+    flush();
+    out_ << std::string(indent(), ' ') << printable(titleOf(channel));
+    out_ << (rows.empty() ? ": cannot be read\n" : "\n");
+    printTable(std::move(columns), std::move(rows), indent() + 2);
+  }
+
+  std::string residencyText(const plist::Dictionary& channel, std::int64_t residency) const {
+    const std::int64_t unit = IOReportChannelGetUnit(channel);
+    const double seconds = unit == kInvalidValue || residency < 0
+                               ? std::nan("")
+                               : IOReportScaleValue(static_cast<std::uint64_t>(residency),
+                                                    static_cast<std::uint64_t>(unit), kUnitSeconds);
+    return std::isnan(seconds) ? countText(residency, isDelta_) : format("%.3f s", seconds);
+  }
+
+  void printStates(const plist::Dictionary& channel) {
+    Rows rows;
+    const std::int32_t current = IOReportStateGetCurrent(channel);
+    const Elements states = elementsOfType(channel, kFormatState);
+    const plist::Array names = stateNames(channel);
+    const std::uint64_t total = totalResidency(states);
+    for (std::size_t i = 0; i < states.count(); ++i) {
+      const auto name = names.at(i).string();
+      const double duty = dutyCycle(states, i, total);
+      const bool hasDuty = !std::isnan(duty);
+      const auto steps = static_cast<std::uint64_t>(hasDuty ? duty * double{kBarSteps} : 0.0);
+      const std::string entered = countText(states.value(i, kStateInTransitions), isDelta_);
+      rows.push_back({name ? std::string(*name) : format("%#llx", states.value(i, kStateID)),
+                      hasDuty ? format("%.1f%%", duty * 100.0) : "-",
+                      bar(duty > 0.0 ? std::max<std::uint64_t>(steps, 1) : 0, kBarSteps, kBarWidth),
+                      residencyText(channel, states.value(i, kStateResidency)),
+                      "entered " + entered,
+                      static_cast<std::int32_t>(i) == current ? "current" : ""});
+    }
+    printBlock(channel,
+               {{""},
+                {"", Table::Align::Right},
+                {""},
+                {"", Table::Align::Right},
+                {"", Table::Align::Right},
+                {""}},
+               std::move(rows));
+  }
+
+  // Once there are no bounds, there are none for the buckets behind either.
+  static std::string boundsText(const plist::Dictionary& channel, std::int32_t bucket,
+                                bool& hasBounds) {
+    std::int64_t lower = 0;
+    std::int64_t upper = 0;
+    hasBounds = hasBounds &&
+                IOReportHistogramGetBucketBounds(channel, bucket, &lower, &upper) == kKernelSuccess;
+    return hasBounds ? format("(%llu, %llu]", lower, upper) : format("bucket %d", bucket);
+  }
+
+  void printHistogram(const plist::Dictionary& channel) {
+    const std::int32_t count = IOReportHistogramGetBucketCount(channel);
+    std::uint64_t largest = 0;
+    std::vector<std::int64_t> hits;
+    for (std::int32_t i = 0; i < count; ++i) {
+      hits.push_back(IOReportHistogramGetBucketHits(channel, i));
+      if (hits.back() == kInvalidValue) break;
+      if (hits.back() > 0) largest = std::max(largest, static_cast<std::uint64_t>(hits.back()));
+    }
+    Rows rows;
+    bool hasBounds = true;
+    for (std::int32_t i = 0; i < count && hits.back() != kInvalidValue; ++i) {
+      const std::int64_t hitsOf = hits[static_cast<std::size_t>(i)];
+      const std::int64_t sum = IOReportHistogramGetBucketSum(channel, i);
+      std::string spread;
+      if (hitsOf > 0 && sum != kInvalidValue) {
+        spread =
+            format("mean %.1f, %s to %s", static_cast<double>(sum) / static_cast<double>(hitsOf),
+                   signedText(IOReportHistogramGetBucketMinValue(channel, i)),
+                   signedText(IOReportHistogramGetBucketMaxValue(channel, i)));
+      }
+      rows.push_back({boundsText(channel, i, hasBounds), countText(hitsOf, isDelta_),
+                      bar(hitsOf > 0 ? static_cast<std::uint64_t>(hitsOf) : 0, largest, kBarWidth),
+                      std::move(spread)});
+    }
+    printBlock(channel, {{""}, {"", Table::Align::Right}, {""}, {""}}, std::move(rows));
+  }
+
+  void printArray(const plist::Dictionary& channel) {
+    const Elements elements = getRawElements(channel, kFormatSimpleArray);
+    const auto count = static_cast<std::int32_t>(kElementValues * elements.count());
+    constexpr auto kColumns = static_cast<std::int32_t>(kElementValues);
+    Rows rows;
+    for (std::int32_t i = 0; i < count; ++i) {
+      if (i % kColumns == 0) rows.push_back({format("[%d]", i)});
+      rows.back().push_back(signedText(IOReportArrayGetValueAtIndex(channel, i)));
+    }
+    constexpr auto kRight = Table::Align::Right;
+    printBlock(channel, {{"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}},
+               std::move(rows));
+  }
+
+  std::ostream& out_;
+  const bool isDelta_;
+  const std::optional<std::size_t> columns_;
+  Place place_;
+  Rows simple_;
+};
+
+}  // namespace
+
+void printChannels(std::ostream& out, const plist::Dictionary& channels, bool flat,
+                   std::optional<std::size_t> columns) {
+  std::vector<Table::Column> titles{
+      {"CHANNEL"}, {"FORMAT"}, {"UNIT"}, {"CATEGORIES"}, {"ELEMENTS", Table::Align::Right}, {"ID"}};
+  if (flat) titles.insert(titles.begin(), {{"DRIVER"}, {"GROUP"}, {"SUBGROUP"}});
+  Table table(std::move(titles));
+  Place last;
+  for (const plist::Dictionary& channel : channelsIn(channels)) {
+    std::vector<std::string> cells = cellsOf(channel);
+    Place place(channel);
+    if (flat) {
+      cells.insert(cells.begin(),
+                   {textOr(IOReportChannelGetDriverName(channel), ""),
+                    textOr(IOReportChannelGetGroup(channel), ""),
+                    textOr(IOReportChannelGetSubGroup(channel), ""), nameOf(channel)});
+    } else {
+      place.forNew(last, [&](std::size_t depth, const std::string& name) {
+        table.add({std::string(2 * depth, ' ') + name});
+      });
+      cells.insert(cells.begin(), std::string(2 * place.depth(), ' ') + nameOf(channel));
+    }
+    table.add(std::move(cells));
+    last = std::move(place);
+  }
+  if (!table.empty()) table.print(out, columns);
+}
+
+void printSamples(std::ostream& out, const plist::Dictionary& samples, bool isDelta,
+                  std::optional<std::size_t> columns) {
+  SamplePrinter printer(out, isDelta, columns);
+  for (const plist::Dictionary& channel : channelsIn(samples))
+    printer.print(channel);
+  printer.flush();
+}
+
+}  // namespace tavrel

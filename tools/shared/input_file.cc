@@ -1,0 +1,85 @@
+#include "tools/shared/input_file.h"
+
+#include <fstream>
+#include <istream>
+#include <iterator>
+#include <sys/stat.h>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/files/system_error.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/plist/coding.h"
+#include "tools/shared/json_value.h"
+
+namespace tavrel {
+namespace {
+
+Error tooLarge(std::string_view name, std::size_t largest) {
+  return Error{format("%s: more than %zu bytes: give a smaller one", name, largest)};
+}
+
+Expected<std::string> readStream(std::istream& in, std::string_view name, std::size_t largest) {
+  std::string bytes;
+  constexpr std::size_t kBlock = 64U << 10;
+  while (in) {
+    const std::size_t before = bytes.size();
+    bytes.resize(before + kBlock);
+    in.read(bytes.data() + before, kBlock);
+    bytes.resize(before + static_cast<std::size_t>(in.gcount()));
+    if (bytes.size() > largest) return tooLarge(name, largest);
+  }
+  if (in.bad()) return Error{format("%s: cannot be read", name)};
+  return bytes;
+}
+
+// Both encodings of property lists begin with other characters.
+bool looksLikeJson(std::string_view bytes) {
+  const std::size_t first = bytes.find_first_not_of(" \t\r\n");
+  return first != std::string_view::npos &&
+         std::string_view("{[\"-0123456789tfn").find(bytes[first]) != std::string_view::npos;
+}
+
+}  // namespace
+
+Expected<std::string> readInput(ToolContext& context, const std::string& file,
+                                std::size_t largest) {
+  if (file == "-") return readStream(context.in(), "standard input", largest);
+  const auto status = FileSystem::status(file);
+  if (status && S_ISDIR(status->st_mode)) {
+    return Error{
+        format("cannot read %s: it is a folder: give a file, or - for standard input", file)};
+  }
+  // A pipe is what a shell makes of <(command).
+  if (status && !S_ISREG(status->st_mode)) {
+    std::ifstream in(file, std::ios::binary);
+    if (!in) return systemError("read", file);
+    return readStream(in, file, largest);
+  }
+  if (status && static_cast<std::uint64_t>(status->st_size) > largest) {
+    return tooLarge(file, largest);
+  }
+  return context.linuxPlatform().fileSystem().read(file, largest);
+}
+
+Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
+  auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
+  if (!value) {
+    // The decoder does not know that JSON would do as well.
+    constexpr std::string_view kNotOne = "not a property list";
+    std::string_view reason = value.error().message;
+    if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};
+    reason.remove_prefix(kNotOne.size());
+    return Error{format("%s: neither a property list nor JSON%s", name, reason)};
+  }
+  return value;
+}
+
+Expected<plist::Value> readDocument(ToolContext& context, const std::string& file) {
+  const auto bytes = readInput(context, file, limits::kPropertyListBytes);
+  if (!bytes) return bytes.error();
+  return decodeDocument(*bytes, file == "-" ? "standard input" : file);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,38 @@
+// A JSON object whose last member is a list, printed element by element: long lists need no memory.
+//
+//   JsonList list(context.out(), {{"sample", 1}}, "channels");
+//   for (...) list.add({{"name", ...}});
+//   list.end();
+#pragma once
+
+#include <cstdint>
+#include <iosfwd>
+#include <string_view>
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+class JsonList {
+ public:
+  /// Indented like other documents, or a single line.
+  enum class Layout : std::uint8_t { Document, Line };
+
+  /// Prints the members of `head`, led by "format_version", and begins the list `name`.
+  JsonList(std::ostream& out, Json head, std::string_view name, Layout layout = Layout::Document);
+
+  void add(const Json& element);
+  /// An element that is JSON already and has no line ends; it is printed as it is.
+  void addText(std::string_view json);
+  /// Ends the list, the object and its line.
+  void end();
+
+ private:
+  void beginElement();
+
+  std::ostream& out_;
+  const Layout layout_;
+  bool isEmpty_ = true;
+};
+
+}  // namespace tavrel

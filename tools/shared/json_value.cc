@@ -1,0 +1,298 @@
+#include "tools/shared/json_value.h"
+
+#include <algorithm>
+#include <charconv>
+#include <cmath>
+#include <vector>
+
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "base/limits.h"
+#include "base/text.h"
+#include "tools/shared/base64.h"
+
+namespace tavrel {
+namespace {
+
+using plist::Kind;
+using Json = nlohmann::ordered_json;
+
+constexpr std::string_view kDataMember = "$data";
+constexpr std::string_view kDateMember = "$date";
+constexpr std::string_view kRealMember = "$real";
+
+// The calendar arithmetic is good for years of 40 bits.
+constexpr double kLargestSeconds = 3e16;
+
+Json special(std::string_view member, std::string text) {
+  return {{std::string(member), std::move(text)}};
+}
+
+// Members go to the end of the object's list: looking for an earlier one of the same name would
+// make large dictionaries quadratic, and a dictionary has none.
+void appendMember(Json& object, std::string key, Json value) {
+  object.get_ref<Json::object_t&>().emplace_back(std::move(key), std::move(value));
+}
+
+Json jsonOfDictionary(const plist::Dictionary& dictionary) {
+  std::vector<const plist::Entry*> entries;
+  entries.reserve(dictionary.size());
+  for (const plist::Entry& entry : dictionary)
+    entries.push_back(&entry);
+  std::sort(entries.begin(), entries.end(),
+            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
+  Json object = Json::object();
+  for (const plist::Entry* entry : entries) {
+    std::string key(entry->key.view());
+    if (key.starts_with('$')) key.insert(0, 1, '$');
+    appendMember(object, std::move(key), jsonOf(entry->value));
+  }
+  return object;
+}
+
+Json jsonOfNumber(const plist::Number& number) {
+  if (number.isFloating()) {
+    if (std::isfinite(number.real())) return number.real();
+    return special(kRealMember, numberText(number));
+  }
+  if (number.kind() == plist::NumberKind::UInt64) return static_cast<std::uint64_t>(number.int64());
+  return number.int64();
+}
+
+Expected<plist::Value> valueOfSpecial(std::string_view member, std::string_view text) {
+  if (member == kDataMember) {
+    const auto bytes = parseBase64(text);
+    if (!bytes) return Error{"\"$data\" is no base64"};
+    return plist::Value(plist::Data(*bytes));
+  }
+  if (member == kDateMember) {
+    const auto date = parseIsoDate(text);
+    if (!date) return date.error();
+    return plist::Value(*date);
+  }
+  for (const double value : {HUGE_VAL, -HUGE_VAL, std::nan("")}) {
+    if (text == numberText(value)) return plist::Value(value);
+  }
+  return Error{"\"$real\" is none of \"nan\", \"inf\", \"-inf\""};
+}
+
+bool isSpecial(std::string_view key) {
+  return key == kDataMember || key == kDateMember || key == kRealMember;
+}
+
+// Builds values straight from the parser's events, so that numbers keep every digit and a deep
+// document is refused before anything recurses over it.
+class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
+ public:
+  plist::Value takeResult() { return std::move(result_); }
+  const std::string& message() const { return message_; }
+
+  bool null() override { return fail("null has no place in a property list"); }
+  bool boolean(bool value) override { return add(value); }
+  bool number_integer(number_integer_t value) override { return add(value); }
+  bool number_unsigned(number_unsigned_t value) override {
+    if (value <= std::uint64_t{INT64_MAX}) return add(static_cast<std::int64_t>(value));
+    return add(value);
+  }
+  bool number_float(number_float_t value, const string_t& text) override {
+    if (text.find_first_of(".eE") == string_t::npos) {
+      return fail(format("the integer %s does not fit 64 bits", text));
+    }
+    return add(value);
+  }
+  bool string(string_t& value) override { return add(std::string_view(value)); }
+  bool binary(binary_t&) override { return fail("unexpected bytes"); }
+
+  bool start_object(std::size_t) override { return open(plist::Dictionary::create()); }
+  bool key(string_t& value) override {
+    levels_.back().key = value;
+    return true;
+  }
+  bool end_object() override {
+    const plist::Dictionary object = levels_.back().container.dictionary();
+    plist::Value value = object;
+    if (levels_.back().isSpecial) {
+      const plist::Entry& only = *object.begin();
+      const auto text = only.value.string();
+      if (object.size() != 1 || !text) {
+        return fail(format("\"%s\" stands alone in its object and holds a text", only.key));
+      }
+      auto meant = valueOfSpecial(only.key, *text);
+      if (!meant) return fail(meant.error().message);
+      value = *std::move(meant);
+    }
+    levels_.pop_back();
+    return add(std::move(value));
+  }
+  bool start_array(std::size_t) override { return open(plist::Array::create()); }
+  bool end_array() override {
+    plist::Value value = std::move(levels_.back().container);
+    levels_.pop_back();
+    return add(std::move(value));
+  }
+
+  bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception& e) override {
+    // The parser's own text begins with a tag in brackets.
+    const std::string_view text = e.what();
+    const std::size_t tag = text.find("] ");
+    message_ = text.substr(tag == std::string_view::npos ? 0 : tag + 2);
+    return false;
+  }
+
+ private:
+  struct Level {
+    plist::Value container;
+    std::string key;         // of the member that comes next
+    bool isSpecial = false;  // a member with one of the special names was seen
+  };
+
+  bool open(plist::Value container) {
+    if (levels_.size() == limits::kPropertyListDepth) return fail("nested too deeply");
+    levels_.push_back({std::move(container), {}});
+    return true;
+  }
+
+  bool add(plist::Value value) {
+    if (++count_ > limits::kPropertyListValues) return fail("too many values");
+    if (levels_.empty()) {
+      result_ = std::move(value);
+      return true;
+    }
+    Level& level = levels_.back();
+    if (auto array = level.container.array()) {
+      array.append(std::move(value));
+      return true;
+    }
+    auto object = level.container.dictionary();
+    std::string_view key = level.key;
+    if (isSpecial(key)) {
+      level.isSpecial = true;
+    } else if (key.starts_with("$$")) {
+      key.remove_prefix(1);
+    } else if (key.starts_with('$')) {
+      return fail(format("\"%s\" is no known form: write a key that begins with $ as $$", key));
+    }
+    object.set(key, std::move(value));
+    return true;
+  }
+
+  bool fail(std::string_view what) {
+    message_ = "JSON";
+    for (const Level& level : levels_) {
+      if (!level.key.empty()) appendFormat(message_, "/%s", level.key);
+    }
+    appendFormat(message_, ": %s", what);
+    return false;
+  }
+
+  std::vector<Level> levels_;
+  plist::Value result_;
+  std::string message_;
+  std::size_t count_ = 0;
+};
+
+}  // namespace
+
+Json jsonOf(const plist::Value& value) {
+  switch (value.kind()) {
+    case Kind::Null:
+      return nullptr;
+    case Kind::Boolean:
+      return *value.boolean();
+    case Kind::Number:
+      return jsonOfNumber(*value.number());
+    case Kind::Date:
+      return special(kDateMember, isoDateText(*value.date()));
+    case Kind::String:
+      return std::string(*value.string());
+    case Kind::Data:
+      return special(kDataMember, base64Text(value.data().bytes()));
+    case Kind::Array: {
+      Json array = Json::array();
+      for (const plist::Value& element : value.array())
+        array.push_back(jsonOf(element));
+      return array;
+    }
+    case Kind::Dictionary:
+      return jsonOfDictionary(value.dictionary());
+  }
+  return nullptr;
+}
+
+Expected<plist::Value> parseJsonValue(std::string_view text) {
+  ValueBuilder builder;
+  if (!nlohmann::json::sax_parse(text.begin(), text.end(), &builder)) {
+    return Error{builder.message()};
+  }
+  return builder.takeResult();
+}
+
+std::string isoDateText(plist::Date date) {
+  const double seconds = date.secondsSinceEpoch();
+  if (!(std::fabs(seconds) < kLargestSeconds)) {
+    return "@" + numberText(date.secondsSince1970());
+  }
+  const double whole = std::floor(seconds);
+  const CivilTime time =
+      civilFromSeconds(static_cast<std::int64_t>(whole) + std::int64_t{978307200});
+  std::string text =
+      format("%sT%02u:%02u:%02u", dateText(time.date), time.hour, time.minute, time.second);
+  if (seconds != whole) {
+    char digits[1100];
+    const auto [end, error] =
+        std::to_chars(digits, digits + sizeof digits, seconds - whole, std::chars_format::fixed);
+    text.append(digits + 1, end);  // without the leading 0
+  }
+  return text + "Z";
+}
+
+Expected<plist::Date> parseIsoDate(std::string_view text) {
+  const Error error{format("not a date: %s: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD", text)};
+  const auto real = [](std::string_view digits) -> std::optional<double> {
+    double value = 0;
+    const auto [stop, code] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
+    if (digits.empty() || code != std::errc() || stop != digits.data() + digits.size()) return {};
+    return value;
+  };
+  if (text.starts_with('@')) {
+    const auto seconds = real(text.substr(1));
+    if (!seconds) return error;
+    return plist::Date::since1970(*seconds);
+  }
+
+  const std::size_t mark = text.find('T');
+  const auto date = parseDate(text.substr(0, mark));
+  if (!date) return error;
+  CivilTime time{*date, 0, 0, 0};
+  double fraction = 0;
+  if (mark != std::string_view::npos) {
+    std::string_view clock = text.substr(mark + 1);
+    if (clock.size() < 9 || clock[2] != ':' || clock[5] != ':' || !clock.ends_with('Z')) {
+      return error;
+    }
+    clock.remove_suffix(1);
+    const auto field = [&](std::size_t at, unsigned largest) -> std::optional<unsigned> {
+      unsigned value = 0;
+      const char* const end = clock.data() + at + 2;
+      const auto [stop, code] = std::from_chars(clock.data() + at, end, value);
+      if (code != std::errc() || stop != end || value > largest) return {};
+      return value;
+    };
+    const auto hour = field(0, 23), minute = field(3, 59), second = field(6, 59);
+    if (!hour || !minute || !second) return error;
+    time = {*date, *hour, *minute, *second};
+    if (clock.size() > 8) {
+      const std::string_view digits = clock.substr(8);
+      if (digits[0] != '.' || digits.find_first_not_of("0123456789", 1) != std::string_view::npos) {
+        return error;
+      }
+      const auto value = real(digits);
+      if (!value) return error;
+      fraction = *value;
+    }
+  }
+  return plist::Date::sinceEpoch(
+      static_cast<double>(secondsFromCivil(time) - std::int64_t{978307200}) + fraction);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,50 @@
+// The device's platform for commands that ask its drivers: what the system's own operations print
+// becomes notes of the tool.
+//
+//   NotingPlatform noting(context);
+//   const plist::Dictionary info = CopyNANDInfo(noting.platform());
+//
+// The context must outlive it.
+#pragma once
+
+#include <string_view>
+
+#include "platform/platform.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// Both standard streams as notes, so that no output of the tool is mixed with them. Each text is a
+/// message of its own, with or without a line end.
+class NotingStreams final : public StandardStreams {
+ public:
+  explicit NotingStreams(ToolContext& context) : context_(context) {}
+
+  void writeOutput(std::string_view text) override;
+  bool hasPrinted() const { return hasPrinted_; }
+  void writeError(std::string_view text) override { writeOutput(text); }
+
+ private:
+  ToolContext& context_;
+  bool hasPrinted_ = false;
+};
+
+class NotingPlatform {
+ public:
+  explicit NotingPlatform(ToolContext& context);
+  NotingPlatform(const NotingPlatform&) = delete;
+  NotingPlatform& operator=(const NotingPlatform&) = delete;
+
+  Platform& platform() { return platform_; }
+  /// Whether the system has said that something is wrong.
+  bool hasErrors() const { return context_.hasComplaints(); }
+  /// Whether the system's own operations have printed anything.
+  bool hasPrinted() const { return streams_.hasPrinted(); }
+
+ private:
+  ToolContext& context_;
+  NotingStreams streams_;
+  Platform platform_;
+};
+
+}  // namespace tavrel

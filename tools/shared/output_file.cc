@@ -1,0 +1,34 @@
+#include "tools/shared/output_file.h"
+
+#include <cerrno>
+#include <cstring>
+#include <filesystem>
+#include <ostream>
+
+#include "base/format.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+
+namespace tavrel {
+
+Status writeOutput(ToolContext& context, const std::string& file, std::string_view bytes) {
+  if (file == "-") {
+    context.out() << bytes;
+    return Done{};
+  }
+  // A device or pipe would be replaced by a file, which is never meant.
+  const auto status = FileSystem::status(file);
+  if (status && !S_ISREG(status->st_mode)) {
+    return Error{format("cannot write %s: it is no regular file: use -o - and redirect", file)};
+  }
+  const auto path = std::filesystem::absolute(file);
+  // Folders that are missing are a slip of the pen here, not something to make.
+  const auto folder = path.parent_path().string();
+  if (!FileSystem::status(folder)) {
+    const char* const reason = std::strerror(errno);
+    return Error{format("cannot write %s: %s: %s", file, folder, reason)};
+  }
+  return context.linuxPlatform().fileSystem().replace(path.string(), asBytes(bytes), 0644);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,16 @@
+// Files that a command line asks to write.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "base/expected.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// Makes `bytes` the content of a file of this machine, in one step; "-" is standard output. The
+/// folder must exist, and what is no regular file is refused.
+Status writeOutput(ToolContext& context, const std::string& file, std::string_view bytes);
+
+}  // namespace tavrel

@@ -1,0 +1,123 @@
+#include "tools/shared/tool_context.h"
+
+#include <cerrno>
+#include <cstring>
+#include <ostream>
+#include <stdexcept>
+#include <utility>
+
+#include "base/format.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+
+Json withFormatVersion(Json object) {
+  Json document = {{"format_version", kJsonFormatVersion}};
+  auto& members = document.get_ref<Json::object_t&>();
+  for (auto& [name, value] : object.get_ref<Json::object_t&>()) {
+    members.emplace_back(name, std::move(value));
+  }
+  return document;
+}
+
+std::string jsonText(const Json& value, int indent) {
+  return value.dump(indent, ' ', false, Json::error_handler_t::replace);
+}
+
+class ToolContext::NotingLog final : public SystemLog {
+ public:
+  explicit NotingLog(ToolContext& context) : context_(context) {}
+  void write(LogLevel level, std::string_view message) override {
+    if (level < LogLevel::Default) return;
+    context_.note(message);
+    context_.hasComplaints_ = context_.hasComplaints_ || level == LogLevel::Error;
+  }
+
+ private:
+  ToolContext& context_;
+};
+
+struct ToolContext::Services {
+  explicit Services(ToolContext& context)
+      : log(context),
+        device(context.root(), {.log = &log}),
+        store(context.root(), device.platform().clock, device.preferences(), log,
+              limits::kStoreBusyMilliseconds, true) {}
+
+  NotingLog log;
+  LinuxPlatform device;
+  SqliteStore store;
+};
+
+ToolContext::ToolContext(const ToolStreams& streams) : streams_(streams) {}
+ToolContext::~ToolContext() = default;
+
+const DeviceRoot& ToolContext::root() {
+  if (!root_) {
+    root_ = std::make_unique<DeviceRoot>(rootFolder_ ? DeviceRoot(*rootFolder_)
+                                                     : DeviceRoot::fromEnvironment());
+    const std::string folder = root_->path("/");
+    if (!FileSystem::status(folder)) {
+      const char* const reason = std::strerror(errno);
+      throw std::runtime_error(format(
+          "cannot use device root %s: %s: name the device's folder with --root or TAVREL_ROOT",
+          folder, reason));
+    }
+  }
+  return *root_;
+}
+
+LinuxPlatform& ToolContext::linuxPlatform() {
+  return services().device;
+}
+
+Platform& ToolContext::platform() {
+  return linuxPlatform().platform();
+}
+
+ToolContext::Services& ToolContext::services() {
+  if (!services_) services_ = std::make_unique<Services>(*this);
+  return *services_;
+}
+
+FilePreferences& ToolContext::preferences() {
+  return services().device.preferences();
+}
+
+SqliteStore& ToolContext::storeForReading() {
+  return services().store;
+}
+
+void ToolContext::addJsonOption(CLI::App& command) {
+  command.add_flag("--json", json_, "Print JSON (format_version 1)");
+}
+
+void ToolContext::printJson(Json object) {
+  streams_.out << jsonText(withFormatVersion(std::move(object)), 2) << '\n';
+}
+
+void ToolContext::printLine(std::string_view message) {
+  streams_.out.flush();
+  streams_.error << "tavrelctl: " << printable(message) << '\n';
+}
+
+void ToolContext::fail(std::string_view message) {
+  printLine(message);
+  exitStatus_ = kExitFailure;
+}
+
+void ToolContext::failUsage(std::string_view message) {
+  printLine(message);
+  exitStatus_ = kExitUsage;
+}
+
+void ToolContext::note(std::string_view message) {
+  printLine(message);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,81 @@
+#include "tools/shared/typed_value.h"
+
+#include <algorithm>
+#include <charconv>
+#include <optional>
+
+#include "base/format.h"
+#include "base/utf8.h"
+#include "tools/shared/json_value.h"
+
+namespace tavrel {
+namespace {
+
+template <class Number>
+std::optional<Number> wholeNumber(std::string_view text) {
+  Number value{};
+  const char* const end = text.data() + text.size();
+  const auto [stop, error] = std::from_chars(text.data(), end, value);
+  if (text.empty() || error != std::errc() || stop != end) return std::nullopt;
+  return value;
+}
+
+Error notA(std::string_view what, std::string_view text, std::string_view expected) {
+  return Error{format("not %s: %s: give %s", what, text, expected)};
+}
+
+Expected<plist::Value> parseBoolean(std::string_view text) {
+  for (const std::string_view yes : {"true", "yes", "on", "1"}) {
+    if (text == yes) return plist::Value(true);
+  }
+  for (const std::string_view no : {"false", "no", "off", "0"}) {
+    if (text == no) return plist::Value(false);
+  }
+  return notA("a boolean", text, "true or false");
+}
+
+}  // namespace
+
+Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind) {
+  switch (kind) {
+    case ArgumentKind::Text:
+      break;
+    case ArgumentKind::Boolean:
+      return parseBoolean(text);
+    case ArgumentKind::Integer:
+      if (const auto number = wholeNumber<std::int64_t>(text)) return plist::Value(*number);
+      if (const auto number = wholeNumber<std::uint64_t>(text)) return plist::Value(*number);
+      return notA("an integer", text, "a decimal number of at most 64 bits");
+    case ArgumentKind::Real:
+      if (const auto number = wholeNumber<double>(text)) return plist::Value(*number);
+      return notA("a real number", text, "a number such as 2.5, 1e-3, inf or nan");
+    case ArgumentKind::Date: {
+      const auto date = parseIsoDate(text);
+      if (!date) return date.error();
+      return plist::Value(*date);
+    }
+  }
+  return plist::Value(text);
+}
+
+bool isXmlText(std::string_view text) {
+  if (!isValidUtf8(text)) return false;
+  while (!text.empty()) {
+    const char32_t codePoint = takeCodePoint(text);
+    const bool isBlank = codePoint == '\t' || codePoint == '\n' || codePoint == '\r';
+    if ((codePoint < 0x20 && !isBlank) || codePoint == 0xFFFE || codePoint == 0xFFFF) return false;
+  }
+  return true;
+}
+
+bool hasXmlTextsOnly(const plist::Value& value) {
+  if (const auto text = value.string()) return isXmlText(*text);
+  const plist::Array array = value.array();
+  if (!std::all_of(array.begin(), array.end(), hasXmlTextsOnly)) return false;
+  for (const plist::Entry& entry : value.dictionary()) {
+    if (!isXmlText(entry.key) || !hasXmlTextsOnly(entry.value)) return false;
+  }
+  return true;
+}
+
+}  // namespace tavrel

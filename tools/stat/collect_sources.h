@@ -1,0 +1,55 @@
+// What the kernel tells of the machine in /proc and /sys, read once.
+//
+// Every figure that could not be read is nothing, never 0.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string_view>
+
+#include "platform/linux/files/device_root.h"
+
+namespace tavrel {
+
+/// Counters count since the machine started; a device that goes takes its part with it.
+struct MachineReading {
+  std::optional<double> uptimeSeconds;
+  std::optional<double> loadOfOneMinute;
+  std::optional<std::uint64_t> processes;
+
+  /// Clock ticks of all CPUs together.
+  struct CpuTicks {
+    std::uint64_t busy;
+    std::uint64_t total;
+  };
+  std::optional<CpuTicks> cpu;
+  std::uint64_t cpus = 0;
+
+  std::optional<std::uint64_t> memoryTotalKib;
+  std::optional<std::uint64_t> memoryAvailableKib;
+  std::optional<std::uint64_t> swapUsedKib;
+
+  /// Bytes over all network interfaces but the loopback.
+  struct Traffic {
+    std::uint64_t in;
+    std::uint64_t out;
+  };
+  std::optional<Traffic> network;
+  /// Bytes of all disks with a device of their own: not of loop devices, mappings and memory.
+  std::optional<Traffic> disk;
+
+  /// The hottest thermal zone.
+  std::optional<double> celsius;
+
+  /// The file system that holds the device's data folder.
+  std::optional<std::uint64_t> diskTotalMib;
+  std::optional<std::uint64_t> diskFreeMib;
+};
+
+/// Files below the root stand in for the machine's own.
+MachineReading readMachine(const DeviceRoot& root);
+
+/// Ticks per second in which the kernel counts CPU time.
+std::int64_t ticksPerSecond();
+
+}  // namespace tavrel

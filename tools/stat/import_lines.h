@@ -1,0 +1,61 @@
+// The text form in which statistics are imported and exported, one row a line:
+//
+//   scalar<TAB>DAY<TAB>KEY<TAB>INTEGER
+//   value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE
+//
+// A day is a number of days since 1970-01-01 or YYYY-MM-DD; a key is UTF-8 without tabs and line
+// ends; SECONDS is the offset within the day; doubles are those of tools/stat/import_number.h.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+
+#include "base/expected.h"
+
+namespace tavrel {
+
+struct ImportLine {
+  enum class Kind : std::uint8_t { Scalar, Value };
+
+  Kind kind = Kind::Scalar;
+  std::int32_t day = 0;
+  std::string_view key;       // borrowed from the line
+  std::int64_t integer = 0;   // of a scalar
+  std::uint32_t seconds = 0;  // of a value
+  double value = 0;           // of a value
+};
+
+/// Reads one line without its end. The error says what is wrong.
+Expected<ImportLine> parseImportLine(std::string_view line);
+
+/// Cuts a stream into lines and reads each.
+class ImportParser {
+ public:
+  using Sink = std::function<Status(const ImportLine& line)>;
+
+  /// Takes the next bytes. Stops at the first line that is bad or that the sink refuses.
+  Status feed(std::string_view bytes, const Sink& sink);
+  /// Takes the last line when the stream does not end with a line end.
+  Status finish(const Sink& sink);
+
+  /// Lines taken so far, the one that was stopped at included.
+  std::uint64_t lines() const { return lines_; }
+
+ private:
+  Status takeLine(std::string_view line, const Sink& sink);
+
+  std::string begun_;  // of a line whose end has not come yet
+  std::uint64_t lines_ = 0;
+};
+
+/// False for a key that the form cannot hold.
+bool isExportable(std::string_view key);
+
+void appendScalarLine(std::string& out, std::int32_t day, std::string_view key,
+                      std::int64_t integer);
+void appendValueLine(std::string& out, std::int32_t day, std::string_view key,
+                     std::uint32_t seconds, double value);
+
+}  // namespace tavrel

@@ -1,0 +1,233 @@
+#include "tools/stat/stat_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <charconv>
+#include <cmath>
+#include <limits>
+#include <memory>
+#include <ostream>
+#include <vector>
+
+#include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+#include "tools/stat/collect.h"
+#include "tools/stat/import_lines.h"
+#include "tools/stat/import_number.h"
+#include "tools/stat/stat_transfer.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string file = "-";
+  std::string key;
+  std::string number;
+  std::vector<std::string> values;
+  std::string day;
+  std::uint32_t seconds = 5;
+};
+
+// The offset of this instant within its day.
+std::uint32_t secondsOfDay(Clock& clock) {
+  const auto now = saturatingInt64(std::floor(clock.now().secondsSince1970()));
+  return static_cast<std::uint32_t>((now % kSecondsPerDay + kSecondsPerDay) % kSecondsPerDay);
+}
+
+// Changes the store in one transaction.
+template <class Change>
+void change(ToolContext& context, Change change) {
+  auto batch = context.linuxPlatform().store().beginBatch();
+  if (!batch) return context.fail(batch.error().message);
+  Status done = change(**batch);
+  if (done) done = (*batch)->commit();
+  if (!done) context.fail(done.error().message);
+}
+
+// A key that the export could not give back is a slip. False after having said so.
+bool checkKey(ToolContext& context, const std::string& key) {
+  if (isExportable(key)) return true;
+  context.failUsage(format("not a key: %s: give UTF-8 text without tabs and line ends",
+                           std::string_view(key).substr(0, 60)));
+  return false;
+}
+
+// Sets or adds to today's value of a scalar.
+template <Status (SqliteBatch::*operation)(std::int32_t, std::string_view, std::int64_t)>
+void changeScalar(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
+  std::int64_t number = 0;
+  const char* const end = arguments.number.data() + arguments.number.size();
+  const auto [stop, error] = std::from_chars(arguments.number.data(), end, number);
+  if (error != std::errc() || stop != end) {
+    return context.failUsage(format("not a 64-bit integer: %s", arguments.number));
+  }
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
+  change(context,
+         [&](SqliteBatch& batch) { return (batch.*operation)(today, arguments.key, number); });
+}
+
+void record(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
+  std::vector<double> values;
+  for (const std::string& text : arguments.values) {
+    const auto value = parseExactDouble(text);
+    if (!value) return context.failUsage(value.error().message);
+    values.push_back(*value);
+  }
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
+  const std::uint32_t seconds = secondsOfDay(context.platform().clock);
+  change(context, [&](SqliteBatch& batch) {
+    Status done = Done{};
+    for (std::size_t i = 0; done && i < values.size(); ++i) {
+      done = batch.appendValue(today, arguments.key, seconds, values[i]);
+    }
+    return done;
+  });
+}
+
+// A day from the command line. False when it is none, which has been said.
+bool parseDayOption(ToolContext& context, const std::string& text,
+                    std::optional<std::int32_t>& day) {
+  if (text.empty()) return true;
+  const auto parsed = parseDay(text, context.platform().statistics->BHDaysSince1970());
+  if (!parsed) {
+    context.failUsage(parsed.error().message);
+    return false;
+  }
+  day = *parsed;
+  return true;
+}
+
+void list(ToolContext& context, const Arguments& arguments) {
+  std::optional<std::int32_t> day;
+  if (!parseDayOption(context, arguments.day, day)) return;
+  const auto history = context.storeForReading().openHistory();
+  if (!history) return context.fail(history.error().message);
+  const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
+  const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
+
+  Table table({{"DAY"}, {"KIND"}, {"KEY"}, {"VALUE", Table::Align::Right}});
+  Json scalars = Json::array();
+  Json distributions = Json::array();
+  const bool json = context.json();
+  const auto rowOf = [](std::string_view key, std::int32_t rowDay) {
+    return Json{{"key", key}, {"day", rowDay}, {"date", dayDateText(rowDay)}};
+  };
+  Status walked = (*history)->walkScalars(
+      arguments.key, first, last,
+      [&](std::string_view key, std::int32_t rowDay, std::int64_t value, bool&) {
+        if (json) {
+          scalars.push_back(rowOf(key, rowDay));
+          scalars.back()["value"] = value;
+        } else {
+          table.add({dayText(rowDay), "scalar", std::string(key), std::to_string(value)});
+        }
+      });
+  if (walked) {
+    walked = (*history)->walkDistributions(
+        arguments.key, first, last,
+        [&](std::string_view key, std::int32_t rowDay, std::int64_t count,
+            BHHistoryDistributionEnumerator&, bool&) {
+          if (json) {
+            distributions.push_back(rowOf(key, rowDay));
+            distributions.back()["count"] = count;
+          } else {
+            table.add({dayText(rowDay), "distribution", std::string(key),
+                       counted(static_cast<std::uint64_t>(count), "value")});
+          }
+        });
+  }
+  if (!walked) return context.fail(walked.error().message);
+  if (json) {
+    context.printJson(
+        {{"scalars", std::move(scalars)}, {"distributions", std::move(distributions)}});
+  } else if (!table.empty()) {
+    table.print(context.out(), context.columns());
+  }
+}
+
+CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  CLI::App* const command = group.add_subcommand(name, description);
+  command->callback([&context, arguments, action] { action(context, *arguments); });
+  return *command;
+}
+
+void addKey(CLI::App& command, Arguments& arguments) {
+  command.add_option("KEY", arguments.key, "Name of the statistic")->required();
+}
+
+void addSelection(CLI::App& command, Arguments& arguments) {
+  command.add_option("PREFIX", arguments.key, "Only keys that begin with this");
+  command
+      .add_option("--day", arguments.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
+      ->type_name("DAY");
+}
+
+}  // namespace
+
+void addStatCommands(CLI::App& app, ToolContext& context) {
+  CLI::App* const group = app.add_subcommand("stat", "Statistics that are kept in the store");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  CLI::App& import = addCommand(*group, "import",
+                                "Import lines: scalar<TAB>DAY<TAB>KEY<TAB>INTEGER or "
+                                "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
+                                arguments, context, [](ToolContext& tool, const Arguments& given) {
+                                  importStatistics(tool, given.file);
+                                });
+  import.add_option("FILE", arguments->file,
+                    "Kept as a whole or not at all; - is standard input (default)");
+  context.addJsonOption(import);
+
+  CLI::App& exported =
+      addCommand(*group, "export", "Write what is held, in the form that import reads", arguments,
+                 context, [](ToolContext& tool, const Arguments& given) {
+                   std::optional<std::int32_t> day;
+                   if (parseDayOption(tool, given.day, day)) {
+                     exportStatistics(tool, given.key, day);
+                   }
+                 });
+  addSelection(exported, *arguments);
+
+  CLI::App& set = addCommand(*group, "set", "Set today's value of a scalar", arguments, context,
+                             changeScalar<&SqliteBatch::setScalar>);
+  addKey(set, *arguments);
+  set.add_option("N", arguments->number, "64-bit integer")->required();
+
+  CLI::App& add = addCommand(*group, "add", "Add to today's value of a scalar", arguments, context,
+                             changeScalar<&SqliteBatch::addScalar>);
+  addKey(add, *arguments);
+  add.add_option("N", arguments->number, "64-bit integer")->required();
+
+  CLI::App& recorded = addCommand(*group, "record", "Append values to today's distribution",
+                                  arguments, context, record);
+  addKey(recorded, *arguments);
+  recorded
+      .add_option("VALUE", arguments->values,
+                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
+      ->required();
+
+  CLI::App& listed =
+      addCommand(*group, "list", "List what is held, by day", arguments, context, list);
+  addSelection(listed, *arguments);
+  context.addJsonOption(listed);
+
+  CLI::App& collected = addCommand(
+      *group, "collect", "Sample this machine once a second into today's statistics", arguments,
+      context,
+      [](ToolContext& tool, const Arguments& given) { collectStatistics(tool, given.seconds); });
+  collected.add_option("--seconds", arguments->seconds, "How long to sample (default 5)")
+      ->type_name("N");
+  collected.footer(std::string(collectedKeysHelp()));
+}
+
+}  // namespace tavrel

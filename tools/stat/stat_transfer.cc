@@ -1,0 +1,147 @@
+#include "tools/stat/stat_transfer.h"
+
+#include <cerrno>
+#include <cstring>
+#include <fstream>
+#include <istream>
+#include <limits>
+#include <ostream>
+#include <string_view>
+#include <vector>
+
+#include "base/format.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "tools/shared/table.h"
+#include "tools/stat/import_lines.h"
+#include "tools/stat/stat_progress.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kBlockBytes = 1U << 20;
+
+struct Counts {
+  std::uint64_t scalars = 0;
+  std::uint64_t values = 0;
+};
+
+Status feedAll(std::istream& in, const std::string& name, const ImportParser::Sink& sink) {
+  ImportParser parser;
+  std::vector<char> block(kBlockBytes);
+  Status fed = Done{};
+  while (in && fed) {
+    in.read(block.data(), static_cast<std::streamsize>(block.size()));
+    fed = parser.feed({block.data(), static_cast<std::size_t>(in.gcount())}, sink);
+  }
+  if (in.bad()) return Error{format("cannot read %s: %s", name, std::strerror(errno))};
+  if (fed) fed = parser.finish(sink);
+  if (!fed) return Error{format("%s:%llu: %s", name, parser.lines(), fed.error().message)};
+  return fed;
+}
+
+void importStream(ToolContext& context, std::istream& in, const std::string& name) {
+  auto batch = context.linuxPlatform().store().beginBatch();
+  if (!batch) return context.fail(batch.error().message);
+  Counts counts;
+  StatProgress progress(context);
+  const ImportParser::Sink sink = [&](const ImportLine& line) {
+    progress.count(name, counts.scalars + counts.values);
+    if (line.kind == ImportLine::Kind::Scalar) {
+      ++counts.scalars;
+      return (*batch)->setScalar(line.day, line.key, line.integer);
+    }
+    ++counts.values;
+    return (*batch)->appendValue(line.day, line.key, line.seconds, line.value);
+  };
+  if (const Status fed = feedAll(in, name, sink); !fed) {
+    return context.fail(fed.error().message + "; nothing of the file was kept");
+  }
+  if (const Status kept = (*batch)->commit(); !kept) {
+    return context.fail(format("%s; nothing of %s was kept", kept.error().message, name));
+  }
+  if (context.json()) {
+    context.printJson({{"file", name}, {"scalars", counts.scalars}, {"values", counts.values}});
+  } else {
+    context.out() << printable(name) << ": " << counted(counts.scalars, "scalar") << ", "
+                  << counted(counts.values, "value") << '\n';
+  }
+}
+
+// Collects lines and hands them on in large pieces.
+class LineWriter {
+ public:
+  explicit LineWriter(std::ostream& out) : out_(out) {}
+  ~LineWriter() { flush(); }
+  LineWriter(const LineWriter&) = delete;
+  LineWriter& operator=(const LineWriter&) = delete;
+
+  std::string& buffer() { return buffer_; }
+  /// False when the stream takes no more.
+  bool flushIfLarge() { return buffer_.size() < kBlockBytes / 16 || flush(); }
+
+ private:
+  bool flush() {
+    out_.write(buffer_.data(), static_cast<std::streamsize>(buffer_.size()));
+    buffer_.clear();
+    return out_.good();
+  }
+
+  std::ostream& out_;
+  std::string buffer_;
+};
+
+}  // namespace
+
+void importStatistics(ToolContext& context, const std::string& file) {
+  if (file == "-") return importStream(context, context.in(), "standard input");
+  std::ifstream stream(file, std::ios::binary);
+  if (!stream) return context.fail(format("cannot open %s: %s", file, std::strerror(errno)));
+  importStream(context, stream, file);
+}
+
+void exportStatistics(ToolContext& context, const std::string& prefix,
+                      std::optional<std::int32_t> day) {
+  const auto history = context.storeForReading().openHistory();
+  if (!history) return context.fail(history.error().message);
+  const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
+  const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
+
+  StatProgress progress(context);
+  LineWriter writer(context.out());
+  std::uint64_t rows = 0;
+  const auto canBeWritten = [&](std::string_view key) {
+    progress.count("exported", ++rows);
+    if (isExportable(key)) return true;
+    context.fail(
+        format("not exported: the key %s holds a tab, a line end or bytes that are no "
+               "UTF-8: read the store with sqlite3",
+               printable(key.substr(0, 60))));
+    return false;
+  };
+  Status walked = (*history)->walkScalars(
+      prefix, first, last,
+      [&](std::string_view key, std::int32_t rowDay, std::int64_t value, bool& stop) {
+        if (!canBeWritten(key)) return;
+        appendScalarLine(writer.buffer(), rowDay, key, value);
+        stop = !writer.flushIfLarge();
+      });
+  if (walked) {
+    walked = (*history)->walkDistributions(
+        prefix, first, last,
+        [&](std::string_view key, std::int32_t rowDay, std::int64_t,
+            BHHistoryDistributionEnumerator& values, bool& stop) {
+          if (!canBeWritten(key)) return;
+          double value = 0;
+          std::uint32_t seconds = 0;
+          while (!stop && values.getNextValue(value, seconds)) {
+            appendValueLine(writer.buffer(), rowDay, key, seconds, value);
+            stop = !writer.flushIfLarge();
+          }
+        });
+    if (context.hasComplaints()) context.setExitStatus(kExitFailure);
+  }
+  if (!walked) context.fail(walked.error().message);
+}
+
+}  // namespace tavrel

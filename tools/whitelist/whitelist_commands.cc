@@ -1,0 +1,116 @@
+#include "tools/whitelist/whitelist_commands.h"
+
+#include <CLI/CLI.hpp>
+#include <memory>
+#include <ostream>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "base/text.h"
+#include "config/bh_config.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/plist/coding.h"
+#include "tools/shared/input_file.h"
+#include "tools/shared/table.h"
+#include "tools/whitelist/whitelist_check.h"
+#include "tools/whitelist/whitelist_explain.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string file;  // empty for the device's own
+  std::vector<std::string> keys;
+  std::string value;
+};
+
+struct Whitelist {
+  std::string name;  // of the file
+  std::string bytes;
+  plist::Value value;
+};
+
+Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file) {
+  const std::string path = file.empty() ? context.root().path(kWhitelistPath) : file;
+  auto bytes = readInput(context, path, limits::kWhitelistBytes);
+  if (!bytes) return bytes.error();
+  const std::string name = path == "-" ? "standard input" : path;
+  auto value = plist::read(asBytes(*bytes));
+  if (!value) return Error{format("%s: %s", name, value.error().message)};
+  return Whitelist{name, *std::move(bytes), *std::move(value)};
+}
+
+void check(ToolContext& context, const Arguments& arguments) {
+  const auto whitelist = readWhitelist(context, arguments.file);
+  if (!whitelist) return context.fail(whitelist.error().message);
+  const auto findings = checkWhitelist(whitelist->value);
+  if (!findings.empty()) context.setExitStatus(kExitFailure);
+
+  std::string digest;
+  appendHex(digest, context.platform().digest->md5(asBytes(whitelist->bytes)));
+  if (context.json()) {
+    Json list = Json::array();
+    for (const auto& [path, message] : findings) {
+      list.push_back({{"path", path}, {"message", message}});
+    }
+    return context.printJson(
+        {{"file", whitelist->name}, {"digest", digest}, {"findings", std::move(list)}});
+  }
+  for (const auto& [path, message] : findings) {
+    const std::string place = path.empty() ? whitelist->name : path;
+    context.out() << printable(place + ": " + message) << '\n';
+  }
+  if (findings.empty()) {
+    context.out() << printable(whitelist->name) << ": nothing to mend (digest " << digest << ")\n";
+  }
+}
+
+void explain(ToolContext& context, const Arguments& arguments) {
+  std::optional<ExampleValue> example;
+  if (!arguments.value.empty()) {
+    auto parsed = parseExampleValue(arguments.value);
+    if (!parsed) return context.failUsage(parsed.error().message);
+    example = *parsed;
+  }
+  const auto whitelist = readWhitelist(context, arguments.file);
+  if (!whitelist) return context.fail(whitelist.error().message);
+  const auto explanations = explainKeys(context.linuxPlatform(), whitelist->bytes, whitelist->value,
+                                        arguments.keys, example);
+  if (!explanations) return context.fail(explanations.error().message);
+  if (context.json()) {
+    return context.printJson({{"file", whitelist->name}, {"keys", jsonOf(*explanations)}});
+  }
+  for (const KeyExplanation& explanation : *explanations) {
+    printExplanation(context.out(), explanation);
+  }
+}
+
+}  // namespace
+
+void addWhitelistCommands(CLI::App& app, ToolContext& context) {
+  auto* group = app.add_subcommand("whitelist", "Check and explain the whitelist");
+  group->require_subcommand(1);
+  const auto arguments = std::make_shared<Arguments>();
+
+  auto* checkCommand = group->add_subcommand(
+      "check", "Point at what the daemon would ignore; exit status 1 when there is any");
+  checkCommand->add_option("FILE", arguments->file,
+                           "Whitelist (default: the device's own); - is standard input");
+  context.addJsonOption(*checkCommand);
+  checkCommand->callback([&context, arguments] { check(context, *arguments); });
+
+  auto* explainCommand =
+      group->add_subcommand("explain", "Show which rule decides on a key, and with which options");
+  explainCommand->add_option("KEY", arguments->keys, "Statistics keys")->required();
+  explainCommand->add_option("--value", arguments->value, "Also show how this value is coarsened")
+      ->type_name("N");
+  explainCommand
+      ->add_option("--file", arguments->file,
+                   "Whitelist (default: the device's own); - is standard input")
+      ->type_name("FILE");
+  context.addJsonOption(*explainCommand);
+  explainCommand->callback([&context, arguments] { explain(context, *arguments); });
+}
+
+}  // namespace tavrel
