@@ -59,20 +59,21 @@ void addGlobalOptions(CLI::App& app, ToolContext& context) {
 void run(const std::vector<std::string>& arguments, ToolContext& context) {
   CLI::App app("Looks into tavrel and the statistics that it reports.", "tavrelctl");
   addGlobalOptions(app, context);
-  addStatusCommand(app, context);
-  addRehearseCommand(app, context);
-  addLogCommands(app, context);
-  addWhitelistCommands(app, context);
-  addStatCommands(app, context);
-  addSendCommands(app, context);
-  addTaskingCommands(app, context);
-  addNandCommands(app, context);
-  addNandlogCommands(app, context);
-  addRecordsCommands(app, context);
-  addPrefsCommands(app, context);
-  addPlistCommands(app, context);
-  addRegistryCommands(app, context);
-  addReportCommands(app, context);
+  const Command top(app);
+  addStatusCommand(top, context);
+  addRehearseCommand(top, context);
+  addLogCommands(top, context);
+  addWhitelistCommands(top, context);
+  addStatCommands(top, context);
+  addSendCommands(top, context);
+  addTaskingCommands(top, context);
+  addNandCommands(top, context);
+  addNandlogCommands(top, context);
+  addRecordsCommands(top, context);
+  addPrefsCommands(top, context);
+  addPlistCommands(top, context);
+  addRegistryCommands(top, context);
+  addReportCommands(top, context);
 
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));

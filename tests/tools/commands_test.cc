@@ -1,5 +1,7 @@
 // tavrelctl as a whole: usage, preferences, property lists, logs, status.
 
+#include <nlohmann/json.hpp>
+
 #include "base/format.h"
 #include "device.h"
 #include "platform/plist/coding.h"

@@ -1,5 +1,6 @@
 // tavrelctl nand: buffers in, figures out.
 #include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
 
 #include "base/format.h"
 #include "device.h"

@@ -1,6 +1,7 @@
 // tavrelctl records and nandlog.
 #include <csignal>
 #include <functional>
+#include <nlohmann/json.hpp>
 
 #include "base/format.h"
 #include "device.h"

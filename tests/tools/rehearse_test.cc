@@ -1,4 +1,5 @@
 // tavrelctl rehearse, over a device that has something for every step.
+#include <nlohmann/json.hpp>
 #include <regex>
 
 #include "device.h"

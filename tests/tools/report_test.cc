@@ -1,5 +1,6 @@
 // The example recording, looked at with the registry and report commands.
 #include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
 
 #include "base/format.h"
 #include "device.h"

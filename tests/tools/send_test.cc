@@ -1,4 +1,5 @@
 #include <chrono>
+#include <nlohmann/json.hpp>
 
 #include "base/text.h"
 #include "device.h"

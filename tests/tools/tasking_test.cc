@@ -1,4 +1,6 @@
 // tavrelctl tasking
+#include <nlohmann/json.hpp>
+
 #include "device.h"
 #include "platform/linux/linux_platform.h"
 

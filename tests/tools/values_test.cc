@@ -2,6 +2,7 @@
 #include <cmath>
 #include <gtest/gtest.h>
 #include <limits>
+#include <nlohmann/json.hpp>
 #include <sstream>
 
 #include "tools/shared/base64.h"

@@ -1,5 +1,7 @@
 // tavrelctl whitelist
 
+#include <nlohmann/json.hpp>
+
 #include "device.h"
 
 namespace tavrel {

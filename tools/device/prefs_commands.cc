@@ -1,7 +1,7 @@
 #include "tools/device/prefs_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/format.h"
@@ -143,11 +143,10 @@ void list(ToolContext& context, const Arguments& arguments) {
   if (!table.empty()) table.print(context.out(), context.columns());
 }
 
-void addKindOptions(CLI::App& command, const std::shared_ptr<Arguments>& arguments) {
-  auto* kinds = command.add_option_group("Kind of VALUE");
-  kinds->require_option(0, 1);
+void addKindOptions(Command command, const std::shared_ptr<Arguments>& arguments) {
+  const Command kinds = command.addChoice("Kind of VALUE");
   const auto add = [&](const char* name, ArgumentKind kind, const char* description) {
-    kinds->add_flag_callback(
+    kinds.addFlag(
         name,
         [arguments, kind] {
           arguments->kind = kind;
@@ -160,7 +159,7 @@ void addKindOptions(CLI::App& command, const std::shared_ptr<Arguments>& argumen
   add("--int", ArgumentKind::Integer, "A decimal integer of at most 64 bits");
   add("--float", ArgumentKind::Real, "A real number");
   add("--date", ArgumentKind::Date, "YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD, UTC");
-  kinds->add_flag_callback(
+  kinds.addFlag(
       "--plist",
       [arguments] {
         arguments->isDocument = true;
@@ -171,41 +170,40 @@ void addKindOptions(CLI::App& command, const std::shared_ptr<Arguments>& argumen
 
 }  // namespace
 
-void addPrefsCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("prefs", "Read and write preferences");
-  group->require_subcommand(1);
+void addPrefsCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("prefs", "Read and write preferences");
   const auto arguments = std::make_shared<Arguments>();
   const auto add = [&](const char* name, const char* description,
                        void (*action)(ToolContext&, const Arguments&)) {
-    auto* command = group->add_subcommand(name, description);
-    command->callback([&context, arguments, action] { action(context, *arguments); });
+    const Command command = group.addCommand(name, description);
+    command.onRun([&context, arguments, action] { action(context, *arguments); });
     return command;
   };
-  const auto addDomain = [&](CLI::App& command) {
-    return command.add_option("DOMAIN", arguments->domain, "Preference domain");
+  const auto addDomain = [&](Command command) {
+    return command.addOption("DOMAIN", arguments->domain, "Preference domain");
   };
-  const auto addKey = [&](CLI::App& command) {
-    command.add_option("KEY", arguments->key, "Preference key")->required();
+  const auto addKey = [&](Command command) {
+    command.addOption("KEY", arguments->key, "Preference key").required();
   };
 
-  auto* getCommand = add("get", "Print the value of a key", get);
-  addDomain(*getCommand)->required();
-  addKey(*getCommand);
-  context.addJsonOption(*getCommand);
+  const Command getCommand = add("get", "Print the value of a key", get);
+  addDomain(getCommand).required();
+  addKey(getCommand);
+  context.addJsonOption(getCommand);
 
-  auto* setCommand = add("set", "Set a key", set);
-  addDomain(*setCommand)->required();
-  addKey(*setCommand);
-  setCommand->add_option("VALUE", arguments->value, "The value")->required();
-  addKindOptions(*setCommand, arguments);
+  const Command setCommand = add("set", "Set a key", set);
+  addDomain(setCommand).required();
+  addKey(setCommand);
+  setCommand.addOption("VALUE", arguments->value, "The value").required();
+  addKindOptions(setCommand, arguments);
 
-  auto* deleteCommand = add("delete", "Remove a key", remove);
-  addDomain(*deleteCommand)->required();
-  addKey(*deleteCommand);
+  const Command deleteCommand = add("delete", "Remove a key", remove);
+  addDomain(deleteCommand).required();
+  addKey(deleteCommand);
 
-  auto* listCommand = add("list", "List the keys of a domain, or the domains", list);
-  addDomain(*listCommand);
-  context.addJsonOption(*listCommand);
+  const Command listCommand = add("list", "List the keys of a domain, or the domains", list);
+  addDomain(listCommand);
+  context.addJsonOption(listCommand);
 }
 
 }  // namespace tavrel

@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addPrefsCommands(CLI::App& app, ToolContext& context);
+void addPrefsCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

@@ -1,11 +1,11 @@
 #include "tools/device/send_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <array>
 #include <chrono>
 #include <cstddef>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <ostream>
 #include <string>
@@ -129,23 +129,22 @@ void post(ToolContext& context, const std::string& name) {
   printCount(context, name, *count);
 }
 
-void addNotifyCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* group = app.add_subcommand("notify", "Notifications");
-  group->require_subcommand(1);
+void addNotifyCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("notify", "Notifications");
   const auto name = std::make_shared<std::string>();
   const auto timeout = std::make_shared<std::string>();
 
-  CLI::App* waitCommand = group->add_subcommand("wait", "Wait until a notification is posted");
-  waitCommand->add_option("NAME", *name, "Such as com.norvane.tallied.tavrel.logging")->required();
-  waitCommand->add_option("--timeout", *timeout, "Give up after so long, with exit status 1")
-      ->type_name("SECONDS");
-  context.addJsonOption(*waitCommand);
-  waitCommand->callback([&context, name, timeout] { wait(context, *name, *timeout); });
+  const Command waitCommand = group.addCommand("wait", "Wait until a notification is posted");
+  waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging").required();
+  waitCommand.addOption("--timeout", *timeout, "Give up after so long, with exit status 1")
+      .typeName("SECONDS");
+  context.addJsonOption(waitCommand);
+  waitCommand.onRun([&context, name, timeout] { wait(context, *name, *timeout); });
 
-  CLI::App* postCommand = group->add_subcommand("post", "Post a notification");
-  postCommand->add_option("NAME", *name, "The notification")->required();
-  context.addJsonOption(*postCommand);
-  postCommand->callback([&context, name] { post(context, *name); });
+  const Command postCommand = group.addCommand("post", "Post a notification");
+  postCommand.addOption("NAME", *name, "The notification").required();
+  context.addJsonOption(postCommand);
+  postCommand.onRun([&context, name] { post(context, *name); });
 }
 
 }  // namespace
@@ -177,30 +176,28 @@ Expected<plist::Array> appDataOf(const plist::Value& applications) {
   return result;
 }
 
-void addSendCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* group = app.add_subcommand("send", "Send a message to the service, as a client does");
-  group->require_subcommand(1);
+void addSendCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("send", "Send a message to the service, as a client does");
 
-  CLI::App* announceCommand =
-      group->add_subcommand("announce", "Announce that app information will be delivered");
-  announceCommand->callback([&context] {
+  const Command announceCommand =
+      group.addCommand("announce", "Announce that app information will be delivered");
+  announceCommand.onRun([&context] {
     send(context, {{"operation", kAnnounce}}, "Announced app information.");
   });
 
-  CLI::App* forceCommand = group->add_subcommand("force", "Have the daily tasks of a day run");
+  const Command forceCommand = group.addCommand("force", "Have the daily tasks of a day run");
   const auto day = std::make_shared<std::string>();
-  forceCommand->add_option("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD")->required();
-  forceCommand->callback([&context, day] { force(context, *day); });
+  forceCommand.addOption("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD").required();
+  forceCommand.onRun([&context, day] { force(context, *day); });
 
-  CLI::App* deliverCommand = group->add_subcommand("deliver", "Deliver app information");
+  const Command deliverCommand = group.addCommand("deliver", "Deliver app information");
   const auto file = std::make_shared<std::string>();
   deliverCommand
-      ->add_option(
-          "FILE", *file,
-          "Property list or JSON: an array of dictionaries with \"bundle_id\", \"version\", "
-          "\"orbo_id\", \"arch\" and \"uuid\"; - for standard input")
-      ->required();
-  deliverCommand->callback([&context, file] { deliver(context, *file); });
+      .addOption("FILE", *file,
+                 "Property list or JSON: an array of dictionaries with \"bundle_id\", \"version\", "
+                 "\"orbo_id\", \"arch\" and \"uuid\"; - for standard input")
+      .required();
+  deliverCommand.onRun([&context, file] { deliver(context, *file); });
 
   addNotifyCommands(app, context);
 }

@@ -1,7 +1,6 @@
 // tavrelctl send, notify: a client of the service, and the notifications.
 #pragma once
 
-#include <CLI/App.hpp>
 #include <string_view>
 
 #include "base/expected.h"
@@ -10,7 +9,7 @@
 
 namespace tavrel {
 
-void addSendCommands(CLI::App& app, ToolContext& context);
+void addSendCommands(Command app, ToolContext& context);
 
 /// The "app_data" of a delivery: `applications` as they are written in a file, checked, with each
 /// "uuid" as 16 bytes. The error names the element and the entry that is wrong.

@@ -1,6 +1,6 @@
 #include "tools/device/status_command.h"
 
-#include <CLI/CLI.hpp>
+#include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/arithmetic.h"
@@ -123,10 +123,10 @@ void printText(ToolContext& context, const DeviceStatus& status) {
 
 }  // namespace
 
-void addStatusCommand(CLI::App& app, ToolContext& context) {
-  auto* command = app.add_subcommand("status", "Show what tavrel may do, has done and holds");
-  context.addJsonOption(*command);
-  command->callback([&context] {
+void addStatusCommand(Command app, ToolContext& context) {
+  const Command command = app.addCommand("status", "Show what tavrel may do, has done and holds");
+  context.addJsonOption(command);
+  command.onRun([&context] {
     const DeviceStatus status = takeStatus(context);
     if (context.json()) {
       printJson(context, status);

@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addStatusCommand(CLI::App& app, ToolContext& context);
+void addStatusCommand(Command app, ToolContext& context);
 
 }  // namespace tavrel

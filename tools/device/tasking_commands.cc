@@ -1,8 +1,8 @@
 #include "tools/device/tasking_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <cstddef>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 #include <string_view>
@@ -170,23 +170,22 @@ void clear(ToolContext& context) {
 
 }  // namespace
 
-void addTaskingCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* group = app.add_subcommand("tasking", "Settings that the device is tasked with");
-  group->require_subcommand(1);
+void addTaskingCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("tasking", "Settings that the device is tasked with");
 
-  CLI::App* showCommand =
-      group->add_subcommand("show", "Show the scheduled and the applied tasking");
-  context.addJsonOption(*showCommand);
-  showCommand->callback([&context] { show(context); });
+  const Command showCommand =
+      group.addCommand("show", "Show the scheduled and the applied tasking");
+  context.addJsonOption(showCommand);
+  showCommand.onRun([&context] { show(context); });
 
-  CLI::App* scheduleCommand = group->add_subcommand(
-      "schedule", "Check a tasking, a property list or JSON, and schedule it");
+  const Command scheduleCommand =
+      group.addCommand("schedule", "Check a tasking, a property list or JSON, and schedule it");
   auto path = std::make_shared<std::string>();
-  scheduleCommand->add_option("FILE", *path, "The tasking; - for standard input")->required();
-  scheduleCommand->callback([&context, path] { schedule(context, *path); });
+  scheduleCommand.addOption("FILE", *path, "The tasking; - for standard input").required();
+  scheduleCommand.onRun([&context, path] { schedule(context, *path); });
 
-  CLI::App* clearCommand = group->add_subcommand("clear", "Remove the scheduled tasking");
-  clearCommand->callback([&context] { clear(context); });
+  const Command clearCommand = group.addCommand("clear", "Remove the scheduled tasking");
+  clearCommand.onRun([&context] { clear(context); });
 }
 
 }  // namespace tavrel

@@ -1,8 +1,8 @@
 #include "tools/log/log_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <vector>
 
@@ -183,36 +183,36 @@ void preview(ToolContext& context, const Arguments& arguments) {
 
 }  // namespace
 
-void addLogCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("log", "Show submitted logs, and what would be submitted");
-  group->require_subcommand(1);
+void addLogCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("log", "Show submitted logs, and what would be submitted");
   const auto arguments = std::make_shared<Arguments>();
 
-  auto* previewCommand = group->add_subcommand(
+  const Command previewCommand = group.addCommand(
       "preview",
       "Print the document that a run would submit, permission given or not; changes nothing");
   previewCommand
-      ->add_option("--day", arguments->day,
-                   "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
-      ->type_name("DAY");
-  previewCommand->add_flag("-v,--verbose", arguments->verbose,
-                           "Show what the run would write to the system log");
-  context.addJsonOption(*previewCommand);
-  previewCommand->callback([&context, arguments] { preview(context, *arguments); });
+      .addOption("--day", arguments->day,
+                 "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
+      .typeName("DAY");
+  previewCommand.addFlag("-v,--verbose", arguments->verbose,
+                         "Show what the run would write to the system log");
+  context.addJsonOption(previewCommand);
+  previewCommand.onRun([&context, arguments] { preview(context, *arguments); });
 
-  auto* listCommand = group->add_subcommand("list", "List the logs that were submitted");
-  context.addJsonOption(*listCommand);
-  listCommand->callback([&context] { list(context); });
+  const Command listCommand = group.addCommand("list", "List the logs that were submitted");
+  context.addJsonOption(listCommand);
+  listCommand.onRun([&context] { list(context); });
 
-  auto* showCommand = group->add_subcommand("show", "Show a submitted log");
+  const Command showCommand = group.addCommand("show", "Show a submitted log");
   showCommand
-      ->add_option("FILE", arguments->file,
-                   "A log of 'log list', a path, or latest, the last daily one")
-      ->capture_default_str();
-  auto* raw = showCommand->add_flag("--raw", arguments->raw, "Print the log's bytes as they are");
-  context.addJsonOption(*showCommand);
-  raw->excludes("--json");
-  showCommand->callback([&context, arguments] { show(context, *arguments); });
+      .addOption("FILE", arguments->file,
+                 "A log of 'log list', a path, or latest, the last daily one")
+      .showDefault();
+  const Option raw =
+      showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes as they are");
+  context.addJsonOption(showCommand);
+  raw.excludes("--json");
+  showCommand.onRun([&context, arguments] { show(context, *arguments); });
 }
 
 }  // namespace tavrel

@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addLogCommands(CLI::App& app, ToolContext& context);
+void addLogCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

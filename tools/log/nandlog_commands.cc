@@ -1,7 +1,7 @@
 #include "tools/log/nandlog_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <utility>
 #include <vector>
@@ -227,13 +227,12 @@ void show(ToolContext& context) {
 
 }  // namespace
 
-void addNandlogCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("nandlog", "The weekly text log of the storage's health");
-  group->require_subcommand(1);
-  auto* showCommand = group->add_subcommand(
-      "show", "Show the newest NAND log, and when the next one may be written");
-  context.addJsonOption(*showCommand);
-  showCommand->callback([&context] { show(context); });
+void addNandlogCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("nandlog", "The weekly text log of the storage's health");
+  const Command showCommand =
+      group.addCommand("show", "Show the newest NAND log, and when the next one may be written");
+  context.addJsonOption(showCommand);
+  showCommand.onRun([&context] { show(context); });
 }
 
 }  // namespace tavrel

@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addNandlogCommands(CLI::App& app, ToolContext& context);
+void addNandlogCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

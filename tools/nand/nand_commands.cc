@@ -1,7 +1,7 @@
 #include "tools/nand/nand_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 
@@ -189,60 +189,59 @@ void build(ToolContext& context, const Arguments& arguments) {
 
 }  // namespace
 
-void addNandCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("nand", "Inspect the flash storage and its raw buffers");
-  group->require_subcommand(1);
+void addNandCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("nand", "Inspect the flash storage and its raw buffers");
   const auto arguments = std::make_shared<Arguments>();
-  const auto addFile = [&](CLI::App& command, const char* what) {
-    return command.add_option("FILE", arguments->file, what);
+  const auto addFile = [&](Command command, const char* what) {
+    return command.addOption("FILE", arguments->file, what);
   };
 
-  auto* infoCommand = group->add_subcommand("info", "Show the health of the flash");
-  context.addJsonOption(*infoCommand);
-  infoCommand->callback([&context] { info(context); });
+  const Command infoCommand = group.addCommand("info", "Show the health of the flash");
+  context.addJsonOption(infoCommand);
+  infoCommand.onRun([&context] { info(context); });
 
-  auto* parseCommand = group->add_subcommand("parse", "Show every statistic of a raw buffer");
-  addFile(*parseCommand, "Statistics buffer; - is standard input")->required();
-  parseCommand->add_option("--diff", arguments->other, "Show what differs in this later buffer")
-      ->type_name("FILE2");
-  context.addJsonOption(*parseCommand);
-  parseCommand->callback([&context, arguments] {
+  const Command parseCommand = group.addCommand("parse", "Show every statistic of a raw buffer");
+  addFile(parseCommand, "Statistics buffer; - is standard input").required();
+  parseCommand.addOption("--diff", arguments->other, "Show what differs in this later buffer")
+      .typeName("FILE2");
+  context.addJsonOption(parseCommand);
+  parseCommand.onRun([&context, arguments] {
     arguments->other.empty() ? parse(context, *arguments) : compare(context, *arguments);
   });
 
-  auto* countersCommand =
-      group->add_subcommand("counters", "Show the counters of a NAND chip's block");
-  addFile(*countersCommand, "Counter block of 4096 bytes; - is standard input")->required();
-  countersCommand->add_option("--chip-id", arguments->chipId, "The controller's, such as K3V")
-      ->required();
+  const Command countersCommand =
+      group.addCommand("counters", "Show the counters of a NAND chip's block");
+  addFile(countersCommand, "Counter block of 4096 bytes; - is standard input").required();
+  countersCommand.addOption("--chip-id", arguments->chipId, "The controller's, such as K3V")
+      .required();
   countersCommand
-      ->add_option("--manufacturer-id", arguments->manufacturerId,
-                   "The controller's, in hexadecimal digits")
-      ->required();
-  context.addJsonOption(*countersCommand);
-  countersCommand->callback([&context, arguments] { counters(context, *arguments); });
+      .addOption("--manufacturer-id", arguments->manufacturerId,
+                 "The controller's, in hexadecimal digits")
+      .required();
+  context.addJsonOption(countersCommand);
+  countersCommand.onRun([&context, arguments] { counters(context, *arguments); });
 
-  auto* snapshotCommand =
-      group->add_subcommand("snapshot", "Render the controller's timeline as text");
-  addFile(*snapshotCommand, "Snapshot records; - is standard input")->required();
+  const Command snapshotCommand =
+      group.addCommand("snapshot", "Render the controller's timeline as text");
+  addFile(snapshotCommand, "Snapshot records; - is standard input").required();
   snapshotCommand
-      ->add_option("--descriptor", arguments->other,
-                   "What describes the records (default: the fixed layout)")
-      ->type_name("FILE");
-  snapshotCommand->callback([&context, arguments] { snapshot(context, *arguments); });
+      .addOption("--descriptor", arguments->other,
+                 "What describes the records (default: the fixed layout)")
+      .typeName("FILE");
+  snapshotCommand.onRun([&context, arguments] { snapshot(context, *arguments); });
 
-  auto* freezerCommand =
-      group->add_subcommand("freezer", "Show the flash writes of the memory freezer");
-  addFile(*freezerCommand, "Stack snapshot (default: the device's); - is standard input");
-  context.addJsonOption(*freezerCommand);
-  freezerCommand->callback([&context, arguments] { freezer(context, *arguments); });
+  const Command freezerCommand =
+      group.addCommand("freezer", "Show the flash writes of the memory freezer");
+  addFile(freezerCommand, "Stack snapshot (default: the device's); - is standard input");
+  context.addJsonOption(freezerCommand);
+  freezerCommand.onRun([&context, arguments] { freezer(context, *arguments); });
 
-  auto* buildCommand = group->add_subcommand("build", "Make a statistics buffer from JSON");
-  addFile(*buildCommand, "Its entries, as nand parse --json prints them; - is standard input")
-      ->required();
-  buildCommand->add_option("-o,--output", arguments->output, "File to write; - is standard output")
-      ->required();
-  buildCommand->callback([&context, arguments] { build(context, *arguments); });
+  const Command buildCommand = group.addCommand("build", "Make a statistics buffer from JSON");
+  addFile(buildCommand, "Its entries, as nand parse --json prints them; - is standard input")
+      .required();
+  buildCommand.addOption("-o,--output", arguments->output, "File to write; - is standard output")
+      .required();
+  buildCommand.onRun([&context, arguments] { build(context, *arguments); });
 }
 
 }  // namespace tavrel

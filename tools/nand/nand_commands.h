@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addNandCommands(CLI::App& app, ToolContext& context);
+void addNandCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

@@ -1,6 +1,7 @@
 #include "tools/nand/nand_counters.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <span>
 #include <string>

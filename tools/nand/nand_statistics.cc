@@ -1,6 +1,7 @@
 #include "tools/nand/nand_statistics.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <utility>
 

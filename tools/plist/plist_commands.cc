@@ -1,7 +1,7 @@
 #include "tools/plist/plist_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/format.h"
@@ -50,32 +50,31 @@ void convert(ToolContext& context, const Arguments& arguments) {
 
 }  // namespace
 
-void addPlistCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("plist", "Read and convert property lists");
-  group->require_subcommand(1);
+void addPlistCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("plist", "Read and convert property lists");
   const auto arguments = std::make_shared<Arguments>();
-  const auto addFile = [&](CLI::App& command) {
+  const auto addFile = [&](Command command) {
     command
-        .add_option("FILE", arguments->file,
-                    "Property list of either encoding, or JSON; - is standard input")
-        ->required();
+        .addOption("FILE", arguments->file,
+                   "Property list of either encoding, or JSON; - is standard input")
+        .required();
   };
 
-  auto* showCommand = group->add_subcommand("show", "Print a property list for people");
-  addFile(*showCommand);
-  context.addJsonOption(*showCommand);
-  showCommand->callback([&context, arguments] { show(context, *arguments); });
+  const Command showCommand = group.addCommand("show", "Print a property list for people");
+  addFile(showCommand);
+  context.addJsonOption(showCommand);
+  showCommand.onRun([&context, arguments] { show(context, *arguments); });
 
-  auto* convertCommand = group->add_subcommand("convert", "Convert a property list");
-  addFile(*convertCommand);
-  convertCommand->add_option("--to", arguments->form, "The form to write")
-      ->capture_default_str()
-      ->check(CLI::IsMember({"xml", "binary", "json"}));
+  const Command convertCommand = group.addCommand("convert", "Convert a property list");
+  addFile(convertCommand);
+  convertCommand.addOption("--to", arguments->form, "The form to write")
+      .showDefault()
+      .oneOf({"xml", "binary", "json"});
   convertCommand
-      ->add_option("-o,--output", arguments->output,
-                   "File to write, in one step; - is standard output")
-      ->capture_default_str();
-  convertCommand->callback([&context, arguments] { convert(context, *arguments); });
+      .addOption("-o,--output", arguments->output,
+                 "File to write, in one step; - is standard output")
+      .showDefault();
+  convertCommand.onRun([&context, arguments] { convert(context, *arguments); });
 }
 
 }  // namespace tavrel

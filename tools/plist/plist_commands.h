@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addPlistCommands(CLI::App& app, ToolContext& context);
+void addPlistCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

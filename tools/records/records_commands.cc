@@ -1,9 +1,9 @@
 #include "tools/records/records_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <map>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <optional>
 #include <ostream>
 #include <set>
@@ -209,39 +209,39 @@ Expected<Selection> selectionOf(ToolContext& context, const Arguments& arguments
   return selection;
 }
 
-void addSelectionOptions(CLI::App& command, Arguments& arguments) {
+void addSelectionOptions(Command command, Arguments& arguments) {
   command
-      .add_option("--type", arguments.type,
-                  "Only those of one type: 172 for ECC events, 176 for telemetry and defects")
-      ->type_name("N");
+      .addOption("--type", arguments.type,
+                 "Only those of one type: 172 for ECC events, 176 for telemetry and defects")
+      .typeName("N");
   command
-      .add_option("--day", arguments.day,
-                  "Only those of one day: today, yesterday, a day number or YYYY-MM-DD, UTC")
-      ->type_name("DAY");
+      .addOption("--day", arguments.day,
+                 "Only those of one day: today, yesterday, a day number or YYYY-MM-DD, UTC")
+      .typeName("DAY");
 }
 
 }  // namespace
 
-void addRecordsCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("records", "Show structured diagnostic records");
-  group->require_subcommand(1);
+void addRecordsCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("records", "Show structured diagnostic records");
 
   const auto arguments = std::make_shared<Arguments>();
-  auto* listCommand = group->add_subcommand("list", "List the files of records, by day and type");
-  addSelectionOptions(*listCommand, *arguments);
-  context.addJsonOption(*listCommand);
-  listCommand->callback([&context, arguments] {
+  const Command listCommand =
+      group.addCommand("list", "List the files of records, by day and type");
+  addSelectionOptions(listCommand, *arguments);
+  context.addJsonOption(listCommand);
+  listCommand.onRun([&context, arguments] {
     const auto selection = selectionOf(context, *arguments);
     if (!selection) return context.failUsage(selection.error().message);
     list(context, *selection);
   });
 
-  auto* showCommand = group->add_subcommand("show", "Show records, oldest day first");
-  addSelectionOptions(*showCommand, *arguments);
-  showCommand->add_flag("-f,--follow", arguments->follow,
-                        "Go on with new records until SIGINT or SIGTERM; with --json one a line");
-  context.addJsonOption(*showCommand);
-  showCommand->callback([&context, arguments] {
+  const Command showCommand = group.addCommand("show", "Show records, oldest day first");
+  addSelectionOptions(showCommand, *arguments);
+  showCommand.addFlag("-f,--follow", arguments->follow,
+                      "Go on with new records until SIGINT or SIGTERM; with --json one a line");
+  context.addJsonOption(showCommand);
+  showCommand.onRun([&context, arguments] {
     const auto selection = selectionOf(context, *arguments);
     if (!selection) return context.failUsage(selection.error().message);
     show(context, *selection, arguments->follow);

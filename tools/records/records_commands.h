@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addRecordsCommands(CLI::App& app, ToolContext& context);
+void addRecordsCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

@@ -1,9 +1,9 @@
 #include "tools/rehearsal/rehearse_command.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <map>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <vector>
 
@@ -254,18 +254,18 @@ struct Arguments {
 
 }  // namespace
 
-void addRehearseCommand(CLI::App& app, ToolContext& context) {
-  auto* command = app.add_subcommand(
+void addRehearseCommand(Command app, ToolContext& context) {
+  const Command command = app.addCommand(
       "rehearse", "Play a daily run and tell what it reads and would write; changes nothing");
   const auto arguments = std::make_shared<Arguments>();
-  auto* forced = command->add_flag("--forced", arguments->forced,
-                                   "The daily tasks for yesterday, done or not (tavrel -f)");
-  command->add_flag("--today", arguments->today, "The daily tasks for today (tavrel -t)")
-      ->excludes(forced);
-  command->add_flag("-v,--verbose", arguments->verbose,
-                    "Show every event, debug messages and the content of logs");
-  context.addJsonOption(*command);
-  command->callback([&context, arguments] {
+  const Option forced = command.addFlag("--forced", arguments->forced,
+                                        "The daily tasks for yesterday, done or not (tavrel -f)");
+  command.addFlag("--today", arguments->today, "The daily tasks for today (tavrel -t)")
+      .excludes(forced);
+  command.addFlag("-v,--verbose", arguments->verbose,
+                  "Show every event, debug messages and the content of logs");
+  context.addJsonOption(command);
+  command.onRun([&context, arguments] {
     const RehearsedRun run = arguments->today    ? RehearsedRun::Today
                              : arguments->forced ? RehearsedRun::Forced
                                                  : RehearsedRun::Gated;

@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addRehearseCommand(CLI::App& app, ToolContext& context);
+void addRehearseCommand(Command app, ToolContext& context);
 
 }  // namespace tavrel

@@ -1,7 +1,7 @@
 #include "tools/report/registry_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 #include <vector>
@@ -128,34 +128,33 @@ void record(ToolContext& context, const Arguments& arguments) {
   }
 }
 
-CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
-                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                     void (*action)(ToolContext&, const Arguments&)) {
-  CLI::App* const command = group.add_subcommand(name, description);
-  command->callback([&context, arguments, action] { action(context, *arguments); });
-  return *command;
+Command addCommand(Command group, const char* name, const char* description,
+                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                   void (*action)(ToolContext&, const Arguments&)) {
+  const Command command = group.addCommand(name, description);
+  command.onRun([&context, arguments, action] { action(context, *arguments); });
+  return command;
 }
 
 }  // namespace
 
-void addRegistryCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* const group = app.add_subcommand("registry", "Services of the recorded drivers");
-  group->require_subcommand(1);
+void addRegistryCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("registry", "Services of the recorded drivers");
   const auto arguments = std::make_shared<Arguments>();
 
-  context.addJsonOption(addCommand(*group, "list", "List the services", arguments, context, list));
+  context.addJsonOption(addCommand(group, "list", "List the services", arguments, context, list));
 
-  CLI::App& shown =
-      addCommand(*group, "show", "Show everything of one service", arguments, context, show);
-  shown.add_option("ID", arguments->id, "Its entry id, decimal or with 0x")->required();
+  const Command shown =
+      addCommand(group, "show", "Show everything of one service", arguments, context, show);
+  shown.addOption("ID", arguments->id, "Its entry id, decimal or with 0x").required();
   context.addJsonOption(shown);
 
-  CLI::App& recorded =
-      addCommand(*group, "record", "Write all recordings as one", arguments, context, record);
+  const Command recorded =
+      addCommand(group, "record", "Write all recordings as one", arguments, context, record);
   recorded
-      .add_option("FILE", arguments->file,
-                  "Property list to write, in one step; - is standard output")
-      ->required();
+      .addOption("FILE", arguments->file,
+                 "Property list to write, in one step; - is standard output")
+      .required();
 }
 
 }  // namespace tavrel

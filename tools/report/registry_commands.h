@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addRegistryCommands(CLI::App& app, ToolContext& context);
+void addRegistryCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

@@ -1,10 +1,10 @@
 #include "tools/report/report_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
 #include <chrono>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string_view>
 #include <thread>
@@ -221,41 +221,40 @@ std::string countFault(const std::string& text) {
   return format("not a number of samples: %s: give 1 or more", text);
 }
 
-CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
-                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                     void (*action)(ToolContext&, const Arguments&)) {
-  CLI::App* const command = group.add_subcommand(name, description);
-  command->callback([&context, arguments, action] { action(context, *arguments); });
-  addSelectionOptions(*command, arguments->selection);
-  return *command;
+Command addCommand(Command group, const char* name, const char* description,
+                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                   void (*action)(ToolContext&, const Arguments&)) {
+  const Command command = group.addCommand(name, description);
+  command.onRun([&context, arguments, action] { action(context, *arguments); });
+  addSelectionOptions(command, arguments->selection);
+  return command;
 }
 
 }  // namespace
 
-void addReportCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* const group = app.add_subcommand("report", "Report channels that drivers publish");
-  group->require_subcommand(1);
+void addReportCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("report", "Report channels that drivers publish");
   const auto arguments = std::make_shared<Arguments>();
 
-  CLI::App& listed = addCommand(*group, "list", "List channels by driver, group and subgroup",
-                                arguments, context, list);
-  listed.add_flag("--flat", arguments->flat, "A table, one line a channel");
+  const Command listed = addCommand(group, "list", "List channels by driver, group and subgroup",
+                                    arguments, context, list);
+  listed.addFlag("--flat", arguments->flat, "A table, one line a channel");
   context.addJsonOption(listed);
 
-  CLI::App& sampled =
-      addCommand(*group, "sample", "Show the values of channels", arguments, context, sample);
-  sampled.add_option("--interval", arguments->interval, "Seconds between samples (default 1)")
-      ->type_name("S")
-      ->check(secondsFault);
-  sampled.add_option("--count", arguments->count, "How many samples (default 1)")
-      ->type_name("N")
-      ->check(countFault);
-  sampled.add_flag("--delta", arguments->delta, "Show what changed since the sample before");
+  const Command sampled =
+      addCommand(group, "sample", "Show the values of channels", arguments, context, sample);
+  sampled.addOption("--interval", arguments->interval, "Seconds between samples (default 1)")
+      .typeName("S")
+      .check(secondsFault);
+  sampled.addOption("--count", arguments->count, "How many samples (default 1)")
+      .typeName("N")
+      .check(countFault);
+  sampled.addFlag("--delta", arguments->delta, "Show what changed since the sample before");
   context.addJsonOption(sampled);
 
-  CLI::App& described = addCommand(*group, "describe", "Print the system's own descriptions",
-                                   arguments, context, describe);
-  described.add_flag("--channels", arguments->channelsOnly, "Of the channels only, not of values");
+  const Command described = addCommand(group, "describe", "Print the system's own descriptions",
+                                       arguments, context, describe);
+  described.addFlag("--channels", arguments->channelsOnly, "Of the channels only, not of values");
 }
 
 }  // namespace tavrel

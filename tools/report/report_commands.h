@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addReportCommands(CLI::App& app, ToolContext& context);
+void addReportCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

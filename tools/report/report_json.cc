@@ -1,6 +1,7 @@
 #include "tools/report/report_json.h"
 
 #include <cmath>
+#include <nlohmann/json.hpp>
 #include <utility>
 
 #include "ioreport/elements.h"

@@ -1,6 +1,5 @@
 #include "tools/report/report_selection.h"
 
-#include <CLI/CLI.hpp>
 #include <algorithm>
 #include <charconv>
 #include <iterator>
@@ -78,29 +77,28 @@ std::optional<std::string_view> given(const std::string& text) {
 
 }  // namespace
 
-void addSelectionOptions(CLI::App& command, ReportSelection& selection) {
-  command.add_option("--group", selection.group, "Only channels of this group")->type_name("NAME");
-  command.add_option("--subgroup", selection.subGroup, "Only channels of this subgroup")
-      ->type_name("NAME");
+void addSelectionOptions(Command command, ReportSelection& selection) {
+  command.addOption("--group", selection.group, "Only channels of this group").typeName("NAME");
+  command.addOption("--subgroup", selection.subGroup, "Only channels of this subgroup")
+      .typeName("NAME");
   command
-      .add_option("--category", selection.categories, "Only channels with one of these categories")
-      ->type_name("MASK")
-      ->check([](const std::string& text) {
+      .addOption("--category", selection.categories, "Only channels with one of these categories")
+      .typeName("MASK")
+      .check([](const std::string& text) {
         return parseMask(text) ? "" : format("not a number of at most 16 bits: %s", text);
       });
   command
-      .add_option(
-          "--format", selection.format,
-          "Only channels of this format: simple, state, histogram, array, unknown, a number")
-      ->type_name("FORMAT")
-      ->check([](const std::string& text) {
+      .addOption("--format", selection.format,
+                 "Only channels of this format: simple, state, histogram, array, unknown, a number")
+      .typeName("FORMAT")
+      .check([](const std::string& text) {
         return parseFormat(text) ? "" : format("not a format of report channels: %s", text);
       });
-  command.add_option("--unit", selection.unit, "Only channels of this unit: a label or its code")
-      ->type_name("UNIT");
+  command.addOption("--unit", selection.unit, "Only channels of this unit: a label or its code")
+      .typeName("UNIT");
   command
-      .add_option("--driver", selection.driver, "Only channels of this driver: its name or its id")
-      ->type_name("DRIVER");
+      .addOption("--driver", selection.driver, "Only channels of this driver: its name or its id")
+      .typeName("DRIVER");
 }
 
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection) {

@@ -1,7 +1,6 @@
 // Which report channels a command is about.
 #pragma once
 
-#include <CLI/App.hpp>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -12,6 +11,7 @@
 #include "base/plist.h"
 #include "ioreport/ioreport.h"
 #include "platform/platform.h"
+#include "tools/shared/command.h"
 
 namespace tavrel {
 
@@ -25,7 +25,7 @@ struct ReportSelection {
   std::string driver;  // its name, with or without the id, or its id
 };
 
-void addSelectionOptions(CLI::App& command, ReportSelection& selection);
+void addSelectionOptions(Command command, ReportSelection& selection);
 
 /// The channels that drivers publish and the selection keeps, filed by driver and group. The error
 /// says why channels cannot be had.

@@ -1,6 +1,7 @@
 #include "tools/shared/json_list.h"
 
 #include <algorithm>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 #include <utility>

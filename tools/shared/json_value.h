@@ -11,7 +11,7 @@
 // A key of a dictionary that begins with "$" gets a second one, so that nothing is taken for these.
 #pragma once
 
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <string>
 #include <string_view>
 

@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <stdexcept>
 #include <utility>
@@ -93,8 +94,8 @@ SqliteStore& ToolContext::storeForReading() {
   return services().store;
 }
 
-void ToolContext::addJsonOption(CLI::App& command) {
-  command.add_flag("--json", json_, "Print JSON (format_version 1)");
+void ToolContext::addJsonOption(Command command) {
+  command.addFlag("--json", json_, "Print JSON (format_version 1)");
 }
 
 void ToolContext::printJson(Json object) {

@@ -1,11 +1,11 @@
 // What every subcommand of tavrelctl is given: the device, the streams, and how to end.
 //
-// A group of subcommands registers itself with `void addXxxCommands(CLI::App& app, ToolContext&)`:
+// A group of subcommands registers itself with `void addXxxCommands(Command app, ToolContext&)`:
 //
-//   auto* list = group->add_subcommand("list", "List the pending logs");
+//   const Command list = group.addCommand("list", "List the pending logs");
 //   auto options = std::make_shared<ListOptions>();        // lives as long as the callback
-//   context.addJsonOption(*list);
-//   list->callback([&context, options] {
+//   context.addJsonOption(list);
+//   list.onRun([&context, options] {
 //     const auto logs = findLogs(context.root());
 //     if (!logs) return context.fail(logs.error().message);
 //     if (context.json()) return context.printJson({{"logs", toJson(*logs)}});
@@ -15,14 +15,15 @@
 // `runTavrelctl` (tools/tavrelctl.h) owns the context; the streams are the caller's.
 #pragma once
 
-#include <CLI/App.hpp>
 #include <cstddef>
 #include <iosfwd>
 #include <memory>
-#include <nlohmann/json.hpp>
+#include <nlohmann/json_fwd.hpp>
 #include <optional>
 #include <string>
 #include <string_view>
+
+#include "tools/shared/command.h"
 
 namespace tavrel {
 
@@ -95,7 +96,7 @@ class ToolContext {
   // -- JSON --------------------------------------------------------------------------------------
 
   /// Adds `--json` to a subcommand that prints data.
-  void addJsonOption(CLI::App& command);
+  void addJsonOption(Command command);
   bool json() const { return json_; }
   /// Prints `object` as an indented document, led by the member "format_version".
   void printJson(Json object);

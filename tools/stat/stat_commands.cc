@@ -1,10 +1,10 @@
 #include "tools/stat/stat_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <charconv>
 #include <cmath>
 #include <limits>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <vector>
 
@@ -152,44 +152,43 @@ void list(ToolContext& context, const Arguments& arguments) {
   }
 }
 
-CLI::App& addCommand(CLI::App& group, const char* name, const char* description,
-                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                     void (*action)(ToolContext&, const Arguments&)) {
-  CLI::App* const command = group.add_subcommand(name, description);
-  command->callback([&context, arguments, action] { action(context, *arguments); });
-  return *command;
+Command addCommand(Command group, const char* name, const char* description,
+                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                   void (*action)(ToolContext&, const Arguments&)) {
+  const Command command = group.addCommand(name, description);
+  command.onRun([&context, arguments, action] { action(context, *arguments); });
+  return command;
 }
 
-void addKey(CLI::App& command, Arguments& arguments) {
-  command.add_option("KEY", arguments.key, "Name of the statistic")->required();
+void addKey(Command command, Arguments& arguments) {
+  command.addOption("KEY", arguments.key, "Name of the statistic").required();
 }
 
-void addSelection(CLI::App& command, Arguments& arguments) {
-  command.add_option("PREFIX", arguments.key, "Only keys that begin with this");
+void addSelection(Command command, Arguments& arguments) {
+  command.addOption("PREFIX", arguments.key, "Only keys that begin with this");
   command
-      .add_option("--day", arguments.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
-      ->type_name("DAY");
+      .addOption("--day", arguments.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
+      .typeName("DAY");
 }
 
 }  // namespace
 
-void addStatCommands(CLI::App& app, ToolContext& context) {
-  CLI::App* const group = app.add_subcommand("stat", "Statistics that are kept in the store");
-  group->require_subcommand(1);
+void addStatCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("stat", "Statistics that are kept in the store");
   const auto arguments = std::make_shared<Arguments>();
 
-  CLI::App& import = addCommand(*group, "import",
-                                "Import lines: scalar<TAB>DAY<TAB>KEY<TAB>INTEGER or "
-                                "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
-                                arguments, context, [](ToolContext& tool, const Arguments& given) {
-                                  importStatistics(tool, given.file);
-                                });
-  import.add_option("FILE", arguments->file,
-                    "Kept as a whole or not at all; - is standard input (default)");
+  const Command import = addCommand(
+      group, "import",
+      "Import lines: scalar<TAB>DAY<TAB>KEY<TAB>INTEGER or "
+      "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
+      arguments, context,
+      [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
+  import.addOption("FILE", arguments->file,
+                   "Kept as a whole or not at all; - is standard input (default)");
   context.addJsonOption(import);
 
-  CLI::App& exported =
-      addCommand(*group, "export", "Write what is held, in the form that import reads", arguments,
+  const Command exported =
+      addCommand(group, "export", "Write what is held, in the form that import reads", arguments,
                  context, [](ToolContext& tool, const Arguments& given) {
                    std::optional<std::int32_t> day;
                    if (parseDayOption(tool, given.day, day)) {
@@ -198,36 +197,36 @@ void addStatCommands(CLI::App& app, ToolContext& context) {
                  });
   addSelection(exported, *arguments);
 
-  CLI::App& set = addCommand(*group, "set", "Set today's value of a scalar", arguments, context,
-                             changeScalar<&SqliteBatch::setScalar>);
+  const Command set = addCommand(group, "set", "Set today's value of a scalar", arguments, context,
+                                 changeScalar<&SqliteBatch::setScalar>);
   addKey(set, *arguments);
-  set.add_option("N", arguments->number, "64-bit integer")->required();
+  set.addOption("N", arguments->number, "64-bit integer").required();
 
-  CLI::App& add = addCommand(*group, "add", "Add to today's value of a scalar", arguments, context,
-                             changeScalar<&SqliteBatch::addScalar>);
+  const Command add = addCommand(group, "add", "Add to today's value of a scalar", arguments,
+                                 context, changeScalar<&SqliteBatch::addScalar>);
   addKey(add, *arguments);
-  add.add_option("N", arguments->number, "64-bit integer")->required();
+  add.addOption("N", arguments->number, "64-bit integer").required();
 
-  CLI::App& recorded = addCommand(*group, "record", "Append values to today's distribution",
-                                  arguments, context, record);
+  const Command recorded = addCommand(group, "record", "Append values to today's distribution",
+                                      arguments, context, record);
   addKey(recorded, *arguments);
   recorded
-      .add_option("VALUE", arguments->values,
-                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
-      ->required();
+      .addOption("VALUE", arguments->values,
+                 "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
+      .required();
 
-  CLI::App& listed =
-      addCommand(*group, "list", "List what is held, by day", arguments, context, list);
+  const Command listed =
+      addCommand(group, "list", "List what is held, by day", arguments, context, list);
   addSelection(listed, *arguments);
   context.addJsonOption(listed);
 
-  CLI::App& collected = addCommand(
-      *group, "collect", "Sample this machine once a second into today's statistics", arguments,
+  const Command collected = addCommand(
+      group, "collect", "Sample this machine once a second into today's statistics", arguments,
       context,
       [](ToolContext& tool, const Arguments& given) { collectStatistics(tool, given.seconds); });
-  collected.add_option("--seconds", arguments->seconds, "How long to sample (default 5)")
-      ->type_name("N");
-  collected.footer(std::string(collectedKeysHelp()));
+  collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
+      .typeName("N");
+  collected.setFooter(std::string(collectedKeysHelp()));
 }
 
 }  // namespace tavrel

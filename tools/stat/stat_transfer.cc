@@ -5,6 +5,7 @@
 #include <fstream>
 #include <istream>
 #include <limits>
+#include <nlohmann/json.hpp>
 #include <ostream>
 #include <string_view>
 #include <vector>

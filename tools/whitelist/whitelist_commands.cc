@@ -1,7 +1,7 @@
 #include "tools/whitelist/whitelist_commands.h"
 
-#include <CLI/CLI.hpp>
 #include <memory>
+#include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/format.h"
@@ -88,29 +88,28 @@ void explain(ToolContext& context, const Arguments& arguments) {
 
 }  // namespace
 
-void addWhitelistCommands(CLI::App& app, ToolContext& context) {
-  auto* group = app.add_subcommand("whitelist", "Check and explain the whitelist");
-  group->require_subcommand(1);
+void addWhitelistCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("whitelist", "Check and explain the whitelist");
   const auto arguments = std::make_shared<Arguments>();
 
-  auto* checkCommand = group->add_subcommand(
+  const Command checkCommand = group.addCommand(
       "check", "Point at what the daemon would ignore; exit status 1 when there is any");
-  checkCommand->add_option("FILE", arguments->file,
-                           "Whitelist (default: the device's own); - is standard input");
-  context.addJsonOption(*checkCommand);
-  checkCommand->callback([&context, arguments] { check(context, *arguments); });
+  checkCommand.addOption("FILE", arguments->file,
+                         "Whitelist (default: the device's own); - is standard input");
+  context.addJsonOption(checkCommand);
+  checkCommand.onRun([&context, arguments] { check(context, *arguments); });
 
-  auto* explainCommand =
-      group->add_subcommand("explain", "Show which rule decides on a key, and with which options");
-  explainCommand->add_option("KEY", arguments->keys, "Statistics keys")->required();
-  explainCommand->add_option("--value", arguments->value, "Also show how this value is coarsened")
-      ->type_name("N");
+  const Command explainCommand =
+      group.addCommand("explain", "Show which rule decides on a key, and with which options");
+  explainCommand.addOption("KEY", arguments->keys, "Statistics keys").required();
+  explainCommand.addOption("--value", arguments->value, "Also show how this value is coarsened")
+      .typeName("N");
   explainCommand
-      ->add_option("--file", arguments->file,
-                   "Whitelist (default: the device's own); - is standard input")
-      ->type_name("FILE");
-  context.addJsonOption(*explainCommand);
-  explainCommand->callback([&context, arguments] { explain(context, *arguments); });
+      .addOption("--file", arguments->file,
+                 "Whitelist (default: the device's own); - is standard input")
+      .typeName("FILE");
+  context.addJsonOption(explainCommand);
+  explainCommand.onRun([&context, arguments] { explain(context, *arguments); });
 }
 
 }  // namespace tavrel

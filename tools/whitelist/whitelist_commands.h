@@ -5,6 +5,6 @@
 
 namespace tavrel {
 
-void addWhitelistCommands(CLI::App& app, ToolContext& context);
+void addWhitelistCommands(Command app, ToolContext& context);
 
 }  // namespace tavrel

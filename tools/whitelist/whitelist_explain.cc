@@ -1,5 +1,6 @@
 #include "tools/whitelist/whitelist_explain.h"
 
+#include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/format.h"

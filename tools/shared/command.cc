@@ -1,0 +1,89 @@
+#include "tools/shared/command.h"
+
+#include <CLI/CLI.hpp>
+#include <cstdint>
+#include <optional>
+#include <utility>
+#include <vector>
+
+namespace tavrel {
+
+Option Option::required() const {
+  option_->required();
+  return *this;
+}
+
+Option Option::typeName(const char* name) const {
+  option_->type_name(name);
+  return *this;
+}
+
+Option Option::showDefault() const {
+  option_->capture_default_str();
+  return *this;
+}
+
+Option Option::oneOf(std::initializer_list<std::string> values) const {
+  option_->check(CLI::IsMember(values));
+  return *this;
+}
+
+Option Option::check(std::function<std::string(const std::string& text)> fault) const {
+  option_->check(std::move(fault));
+  return *this;
+}
+
+Option Option::excludes(const Option& other) const {
+  option_->excludes(other.option_);
+  return *this;
+}
+
+Option Option::excludes(const char* otherName) const {
+  option_->excludes(otherName);
+  return *this;
+}
+
+Command Command::addCommand(const char* name, const char* description) const {
+  return Command(*app_->add_subcommand(name, description));
+}
+
+Command Command::addGroup(const char* name, const char* description) const {
+  CLI::App* const group = app_->add_subcommand(name, description);
+  group->require_subcommand(1);
+  return Command(*group);
+}
+
+Command Command::addChoice(const char* heading) const {
+  CLI::App* const choice = app_->add_option_group(heading);
+  choice->require_option(0, 1);
+  return Command(*choice);
+}
+
+template <class Target>
+Option Command::addOption(const char* names, Target& target, const char* description) const {
+  return Option(*app_->add_option(names, target, description));
+}
+template Option Command::addOption(const char*, std::string&, const char*) const;
+template Option Command::addOption(const char*, double&, const char*) const;
+template Option Command::addOption(const char*, std::uint32_t&, const char*) const;
+template Option Command::addOption(const char*, std::optional<std::uint32_t>&, const char*) const;
+template Option Command::addOption(const char*, std::vector<std::string>&, const char*) const;
+
+Option Command::addFlag(const char* names, bool& target, const char* description) const {
+  return Option(*app_->add_flag(names, target, description));
+}
+
+Option Command::addFlag(const char* names, std::function<void()> onGiven,
+                        const char* description) const {
+  return Option(*app_->add_flag_callback(names, std::move(onGiven), description));
+}
+
+void Command::setFooter(std::string text) const {
+  app_->footer(std::move(text));
+}
+
+void Command::onRun(std::function<void()> action) const {
+  app_->callback(std::move(action));
+}
+
+}  // namespace tavrel
