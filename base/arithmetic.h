@@ -15,7 +15,7 @@ constexpr std::int64_t wrappingSubtract(std::int64_t a, std::int64_t b) {
   return static_cast<std::int64_t>(static_cast<std::uint64_t>(a) - static_cast<std::uint64_t>(b));
 }
 
-/// The day before, in two's complement: the first 32-bit day is followed backwards by the last.
+/// The day before, in two's complement: the day before the first 32-bit day is the last one.
 constexpr std::int32_t previousDay(std::int32_t day) {
   return static_cast<std::int32_t>(static_cast<std::uint32_t>(day) - 1U);
 }
@@ -25,7 +25,7 @@ constexpr std::uint64_t shiftLeft(std::uint64_t value, unsigned bits) {
   return bits < 64 ? value << bits : 0;
 }
 
-/// A product of sizes, or nothing where it would wrap.
+/// The product of two sizes, or nothing when it would wrap.
 constexpr std::optional<std::uint64_t> checkedMultiply(std::uint64_t a, std::uint64_t b) {
   if (b != 0 && a > std::numeric_limits<std::uint64_t>::max() / b) return std::nullopt;
   return a * b;

@@ -1,7 +1,7 @@
-// Checked access to byte buffers that came from outside.
+// Checked access to byte buffers from outside.
 //
-// A load names the buffer and an offset; it yields nothing when the value would not lie wholly
-// inside. Offsets are 64-bit so that no sum of 32-bit fields can wrap before it is checked.
+// A load takes the buffer and an offset, and yields nothing when the value would not lie wholly
+// inside. Offsets are 64-bit, so that no sum of 32-bit fields can wrap before it is checked.
 #pragma once
 
 #include <cstddef>
@@ -16,7 +16,7 @@ namespace tavrel {
 using ByteSpan = std::span<const std::byte>;
 using MutableByteSpan = std::span<std::byte>;
 
-/// The part of `bytes` from `offset` of `length` bytes, or nothing when it is not all there.
+/// The `length` bytes of `bytes` from `offset` on, or nothing when `bytes` ends before.
 constexpr std::optional<ByteSpan> slice(ByteSpan bytes, std::uint64_t offset,
                                         std::uint64_t length) {
   if (offset > bytes.size() || length > bytes.size() - offset) return std::nullopt;
@@ -66,7 +66,7 @@ constexpr std::optional<std::uint64_t> loadLittle64(ByteSpan bytes, std::uint64_
   return bytes_detail::loadLittle<std::uint64_t>(bytes, offset);
 }
 
-/// The stores answer false, and write nothing, when the word would not fit.
+/// The stores return false and write nothing when the word would not fit.
 constexpr bool storeLittle16(MutableByteSpan bytes, std::uint64_t offset, std::uint16_t word) {
   return bytes_detail::storeLittle(bytes, offset, word);
 }

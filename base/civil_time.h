@@ -29,21 +29,21 @@ struct CivilTime {
   bool operator==(const CivilTime&) const = default;
 };
 
-/// Days since 1970-01-01 to a date and back. Good for every day whose year fits 40 bits.
+/// Converts days since 1970-01-01 to a date and back, for any day whose year fits 40 bits.
 CivilDate civilFromDays(std::int64_t days);
 std::int64_t daysFromCivil(const CivilDate& date);
 
-/// Seconds since 1970-01-01 00:00:00 UTC to the fields of a date and back, for any 64-bit instant.
+/// Converts seconds since 1970-01-01 00:00:00 UTC to a date's fields and back, for any 64 bits.
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 
-/// True for a date that the calendar has.
+/// True when the date exists in the calendar.
 bool isValid(const CivilDate& date);
 
 /// "2026-11-16"; years outside 0 to 9999 are written in full, with their sign when negative.
 std::string dateText(const CivilDate& date);
 
-/// Reads "YYYY-MM-DD" in the form that `dateText` writes; nothing for any other text.
+/// Reads "YYYY-MM-DD" as `dateText` writes it; nothing for any other text.
 std::optional<CivilDate> parseDate(std::string_view text);
 
 }  // namespace tavrel

@@ -7,7 +7,7 @@
 
 namespace tavrel {
 
-/// A reason that a person can read: what failed, where, and the system's own words if it had any.
+/// A reason for people to read: what failed, where, and the system's own words if there are any.
 struct Error {
   std::string message;
 };
@@ -33,7 +33,7 @@ class [[nodiscard]] Expected {
   std::variant<T, Error> state_;
 };
 
-/// The outcome of an operation that has nothing to yield.
+/// The outcome of an operation that yields no value.
 struct Done {};
 using Status = Expected<Done>;
 

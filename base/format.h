@@ -1,11 +1,11 @@
-// printf-style formatting with objects, exact to the character with what C's printf prints.
+// printf-style formatting with objects. The text is exactly what C's printf prints.
 //
 //   std::string line = format("daily tasks for day %d", day);
 //   appendFormat(out, "%{public}@: %5.2f", object, value);
 //
-// Formats that are literals are checked against their arguments while the program is compiled.
-// Format texts that a device supplies go through `appendForeignFormat`, which refuses a text that
-// asks for other arguments than it is given. No argument is ever read that is not there.
+// The compiler checks format literals against their arguments. Format texts that a device supplies
+// go through `appendForeignFormat`, which refuses a text that needs arguments other than those
+// given. No missing argument is ever read.
 //
 // Beyond C: "%@" prints an object's text (base/text.h), "(null)" for a null one, with width and
 // precision in bytes as for "%s"; not-a-number has no sign; a null text prints "(null)" whatever
@@ -27,8 +27,8 @@
 
 namespace tavrel {
 
-/// One argument. It borrows texts, which must outlive the call and must not lie in the string that
-/// is appended to.
+/// One argument. It borrows texts; they must outlive the call and must not be part of the string to
+/// which the result is appended.
 class FormatArgument {
  public:
   template <std::integral Integer>
@@ -91,7 +91,7 @@ constexpr ArgumentType argumentTypeOf() {
   }
 }
 
-/// A format literal whose directives agree with arguments of the types `Arguments`.
+/// A format literal whose directives fit arguments of the types `Arguments`.
 template <class... Arguments>
 class CheckedFormat {
  public:
@@ -114,9 +114,10 @@ class CheckedFormat {
 template <class... Arguments>
 using FormatOf = CheckedFormat<std::type_identity_t<Arguments>...>;
 
-/// Appends the formatted text. On failure nothing is appended and the error says which directive
-/// is wrong and why. Widths and precisions are limited (limits::kLargestFormatWidth) also when they
-/// come from an argument, so that the text stays in proportion to the number of arguments.
+/// Appends the formatted text. On failure it appends nothing, and the error says which directive is
+/// wrong and why. The limit on widths and precisions (limits::kLargestFormatWidth) also holds when
+/// they come from an argument, so that the length of the text stays in proportion to the number of
+/// arguments.
 Status appendForeignFormat(std::string& out, std::string_view format,
                            std::span<const FormatArgument> arguments);
 
@@ -125,7 +126,7 @@ void appendChecked(std::string& out, std::string_view format,
                    std::span<const FormatArgument> arguments);
 }  // namespace format_detail
 
-/// Appends the formatted text of a literal. A width that an argument gives ends at the limit.
+/// Appends the formatted text of a literal. A width from an argument is cut to the limit.
 template <class... Arguments>
 void appendFormat(std::string& out, FormatOf<Arguments...> text, const Arguments&... arguments) {
   const std::array<FormatArgument, sizeof...(Arguments)> list{FormatArgument(arguments)...};

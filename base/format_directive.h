@@ -1,7 +1,7 @@
-// One conversion of a printf-style format: how it is read and which argument it takes.
+// One conversion of a printf-style format: its syntax, and the argument that it takes.
 //
-// Everything here is constexpr: literals of the program are checked while it is compiled, format
-// texts that come from outside while they are used.
+// Everything here is constexpr: the compiler checks the program's literals; format texts from
+// outside are checked when they are used.
 #pragma once
 
 #include <cstddef>
@@ -14,7 +14,7 @@
 
 namespace tavrel {
 
-/// What a format can be given. `Int` has 32 bits (narrower integers are promoted), `Long` 64.
+/// The types of arguments. `Int` has 32 bits (narrower integers are promoted), `Long` 64.
 enum class ArgumentType : std::uint8_t { Int, Long, Double, Text, Pointer, Object };
 
 /// "%[flags][width][.precision][length]conversion". "%{public}@" and the like carry an annotation
@@ -62,8 +62,8 @@ constexpr bool take(std::string_view& text, std::string_view prefix) {
   return true;
 }
 
-// Digits up to the largest width; nothing when the number is larger, with `text` at the digit that
-// made it so.
+// Reads digits up to the largest width; nothing when the number is larger, with `text` at the digit
+// that made it too large.
 constexpr std::optional<std::int32_t> takeNumber(std::string_view& text) {
   std::int32_t number = 0;
   while (frontOf(text) >= '0' && frontOf(text) <= '9') {
@@ -110,13 +110,13 @@ constexpr void takeLength(std::string_view& text, Directive& directive) {
 
 }  // namespace format_detail
 
-/// Takes one directive off the front of `text`, which begins behind the "%". Nothing when it is
-/// incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit; then `text`
-/// begins with the character that is wrong, or is empty when the directive is incomplete.
+/// Takes one directive off the front of `text`, which begins after the "%". Nothing when the
+/// directive is incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit;
+/// `text` then begins with the wrong character, or is empty when the directive is incomplete.
 constexpr std::optional<Directive> takeDirective(std::string_view& text) {
   using namespace format_detail;
   Directive directive;
-  // Most directives are a conversion alone.
+  // Most directives consist of a conversion only.
   if (isConversion(frontOf(text))) {
     directive.conversion = text.front();
     text.remove_prefix(1);
@@ -154,8 +154,8 @@ constexpr std::optional<Directive> takeDirective(std::string_view& text) {
   return directive;
 }
 
-/// True when the directive may be given an argument of that type: the widths of integers must
-/// agree, their signedness need not. "%@" takes texts as well as objects.
+/// True when the directive accepts an argument of that type: the widths of integers must agree,
+/// their signedness need not. "%@" takes texts as well as objects.
 constexpr bool accepts(const Directive& directive, ArgumentType type) {
   switch (directive.conversion) {
     case 'd':
@@ -180,7 +180,7 @@ constexpr bool accepts(const Directive& directive, ArgumentType type) {
   }
 }
 
-/// What takes the argument of a "*".
+/// The directive that takes the argument of a "*".
 inline constexpr Directive kStar{.conversion = 'd'};
 
 enum class FormatFault : std::uint8_t {

@@ -1,4 +1,4 @@
-// Kernel return codes: 0 for success, else one of the errors below or a code that a driver chose.
+// Kernel return codes: 0 for success, otherwise one of the errors below or a driver's own code.
 #pragma once
 
 #include <cstdint>

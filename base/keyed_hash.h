@@ -7,8 +7,8 @@
 
 namespace tavrel {
 
-/// SipHash-1-3 under a key drawn once per process: whoever writes the texts cannot make them
-/// collide. Values differ from process to process and must not decide about any order.
+/// SipHash-1-3 under a key drawn once per process: the author of the texts cannot make them
+/// collide. Values differ from process to process and must not decide any order.
 std::uint64_t keyedHash(std::string_view text);
 
 /// The same for hash tables.

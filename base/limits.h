@@ -1,5 +1,5 @@
-// Every limit on data from outside, with its unit and its reason. What is dropped or refused for a
-// limit is said where it happens.
+// Every limit on data from outside, with its unit and its reason. The code that drops or refuses
+// something because of a limit reports it.
 #pragma once
 
 #include <cstddef>
@@ -10,24 +10,23 @@ namespace tavrel::limits {
 /// Width and precision of a format directive, in characters. A format text may come from a device.
 inline constexpr std::int32_t kLargestFormatWidth = 4096;
 
-/// Nesting of containers in a property list, read or written. Every walk over values recurses, and
-/// no document of ours is deeper than ten.
+/// Nesting of containers in a property list, read or written. Walks over values recurse, and no
+/// document of ours is deeper than ten.
 inline constexpr std::size_t kPropertyListDepth = 128;
 
-/// Values in one property list that is read, or written in binary, after shared references are
-/// expanded. Binary documents may refer to one container from many places, so that a few bytes
-/// could stand for an endless tree. What is written as XML, the daily log, is limited by its bytes
-/// alone.
+/// Values in one property list that is read, or written in binary, with shared references expanded.
+/// Binary documents may refer to one container from many places, so a few bytes could stand for an
+/// endless tree. XML that is written, such as the daily log, is limited only by its bytes.
 inline constexpr std::size_t kPropertyListValues = 1'000'000;
 
-/// Bytes of a property-list document. Larger than any preference domain, recording or message.
+/// Bytes of a property-list document: more than any preference domain, recording or message needs.
 inline constexpr std::size_t kPropertyListBytes = 64U << 20;
 
-/// Bytes of the whitelist file. Ten thousand keys with options are one MiB; a larger file counts
-/// as unreadable and keeps the run below 64 MiB of memory.
+/// Bytes of the whitelist file. Ten thousand keys with options are one MiB. A larger file counts as
+/// unreadable, which keeps the run below 64 MiB of memory.
 inline constexpr std::size_t kWhitelistBytes = 4U << 20;
 
-/// Findings about one whitelist that are listed. Nobody reads more at once, and each holds a copy
+/// Findings that are listed about one whitelist. Nobody reads more at once, and each holds a copy
 /// of its place.
 inline constexpr std::size_t kWhitelistFindings = 1000;
 
@@ -42,29 +41,30 @@ inline constexpr std::uint64_t kDeviceAllocationBytes = 64U << 20;
 /// that a buffer of the largest size could ask for two GB. More counts as a failed allocation.
 inline constexpr std::size_t kStatisticsEntries = 1'000'000;
 
-/// How long a locked statistics store is waited for, in milliseconds.
+/// How long to wait for a locked statistics store, in milliseconds.
 inline constexpr int kStoreBusyMilliseconds = 10'000;
 
 /// Bytes of the name of a preference domain. Tasking supplies domains; with its endings the name
 /// must fit the 255 bytes of a file name.
 inline constexpr std::size_t kPreferenceDomainBytes = 200;
 
-/// Bytes of one preference domain's file. No value takes less than nine bytes of it, so that what
-/// was written stays below `kPropertyListValues` and can be read again.
+/// Bytes of one preference domain's file. Each value takes at least nine bytes of it, so a written
+/// file stays below `kPropertyListValues` and can be read again.
 inline constexpr std::size_t kPreferenceFileBytes = 8U << 20;
 
-/// Bytes of one day's structured records of one type. Records come from devices; more of them on
+/// Bytes of one day's structured records of one type. Records come from devices; more of them in
 /// one day would wear the flash and say nothing new.
 inline constexpr std::size_t kStructuredRecordFileBytes = 16U << 20;
 
 /// Bytes of a small configuration file of the system, such as os-release.
 inline constexpr std::size_t kSystemFactBytes = 64U << 10;
 
-/// How long the lock of a file that another process writes is waited for, in milliseconds.
+/// How long to wait for the lock of a file that another process writes, in milliseconds.
 inline constexpr int kFileLockMilliseconds = 10'000;
 
 /// Bytes of a key in the statistics store. Keys are names, far shorter than this. A row is read
-/// whole with its key: without a limit whoever wrote the key would decide how much memory it takes.
+/// whole with its key: without a limit, the writer of the key would decide how much memory that
+/// takes.
 inline constexpr std::size_t kStoreKeyBytes = 1U << 20;
 
 /// Age after which a temporary file that a killed process left behind is removed, in seconds.
@@ -81,7 +81,7 @@ inline constexpr std::size_t kMessageFileBytes = 16U << 20;
 /// Each costs a descriptor.
 inline constexpr std::size_t kServicePeers = 2048;
 
-/// Connections in a row that sent nothing and yet prolong the service's wait. Without a bound a
+/// Connections in a row that send nothing and still prolong the service's wait. Without a bound, a
 /// peer that only connects could keep the process alive for ever.
 inline constexpr int kSilentConnections = 32;
 
@@ -89,28 +89,28 @@ inline constexpr int kSilentConnections = 32;
 /// garbage again must not fill the system log.
 inline constexpr int kRefusalLinesPerMinute = 20;
 
-/// Characters of the name of a service or a notification; it is a file name and goes into a socket
+/// Characters of the name of a service or a notification. It is a file name, and part of a socket
 /// address of 108 bytes.
 inline constexpr std::size_t kServiceNameBytes = 64;
 
 /// Descriptors that the service manager may hand over.
 inline constexpr int kActivationDescriptors = 64;
 
-/// Bytes of a line in a text file of the system. Package descriptions, the longest lines there are,
-/// stay far below.
+/// Bytes of a line in a text file of the system. Package descriptions, the longest lines in such
+/// files, stay far below.
 inline constexpr std::size_t kTextLineBytes = 64U << 10;
 
-/// Desktop entries that are counted. Their names are held while counting.
+/// Desktop entries that are counted. Counting keeps their names in memory.
 inline constexpr std::size_t kDesktopEntries = 100'000;
 
-/// Files and folders that are looked at for desktop entries. Users put what they like into theirs.
+/// Files and folders that are examined for desktop entries. Users may put anything into theirs.
 inline constexpr std::size_t kDesktopFiles = 1'000'000;
 
-/// Bytes of a desktop entry, which has some lines of text in as many languages as there may be.
+/// Bytes of a desktop entry: a few lines of text in many languages.
 inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 
-/// Languages in one list. Matching compares every preferred with every available one; the system's
-/// own list of all locales has some 500.
+/// Languages in one list. Matching compares each preferred language with each available one; the
+/// system's own list of all locales has some 500.
 inline constexpr std::size_t kLanguages = 1'000;
 
 }  // namespace tavrel::limits

@@ -2,20 +2,20 @@
 //
 // `Value` is null, a dictionary, array, string, number, boolean, data or date. It is 16 bytes and
 // cheap to copy: a copy of a dictionary, an array or a data value refers to the same container, so
-// that a change through one copy is seen through all. Copying the content is an explicit call,
-// `mutableCopy` (one level) or `deepCopy`. Strings are immutable.
+// a change through one copy shows in all. Copying the content is an explicit call, `mutableCopy`
+// (one level) or `deepCopy`. Strings are immutable.
 //
-// `Dictionary`, `Array` and `Data` are typed handles on such a container. A handle may be empty:
-// looking something up through an empty handle, or something that is absent or of another type,
-// yields nothing, so that look-ups chain:
+// `Dictionary`, `Array` and `Data` are typed handles on such a container. A handle may be empty. A
+// look-up through an empty handle yields nothing, and so does a look-up of something that is absent
+// or of another type, so look-ups chain:
 //
 //   if (const auto unit = channel.dictionary("Info").number("Unit")) use(unit->int64());
 //
 // Writing through an empty handle first gives it a container of its own. `Array{}` is an empty
 // handle, and so null as a value; a container without elements is `Array::create()`. Dictionaries
-// enumerate in the order of insertion; nothing may be added or removed while one enumerates.
+// enumerate in the order of insertion; add and remove nothing during an enumeration.
 //
-// Nothing here may be shared between threads.
+// Do not share any of this between threads.
 #pragma once
 
 #include <bit>
@@ -40,8 +40,8 @@ enum class Kind : std::uint8_t { Null, Boolean, Number, Date, String, Data, Arra
 
 enum class NumberKind : std::uint8_t { Int8, Int32, Int64, UInt64, Float, Double };
 
-/// A number with its kind. Two numbers are equal when their values are, whatever their kinds;
-/// not-a-number equals itself, so that what was written can be compared with what was read.
+/// A number with its kind. Two numbers are equal when their values are, whatever their kinds.
+/// Not-a-number equals itself, so that a value written can be compared with the value read back.
 class Number {
  public:
   /// The kind is the narrowest that holds every value of the argument's type.
@@ -128,7 +128,7 @@ struct DictionaryRep;
 struct ArrayRep;
 struct DataRep;
 
-/// What strings and containers begin with. The count is not atomic.
+/// The beginning of strings and containers. The count is not atomic.
 struct Shared {
   explicit Shared(Kind kindOfRep) : kind(kindOfRep) {}
   std::uint32_t references = 0;
@@ -205,7 +205,7 @@ class Dictionary {
 
   Dictionary() = default;
   Dictionary(std::initializer_list<Entry> entries);
-  /// A new dictionary without entries, with room for `capacity`.
+  /// A new, empty dictionary with room for `capacity` entries.
   static Dictionary create(std::size_t capacity = 0);
 
   explicit operator bool() const { return static_cast<bool>(rep_); }
@@ -228,7 +228,7 @@ class Dictionary {
   Array array(std::string_view key) const;
   Data data(std::string_view key) const;
 
-  /// Stores `value`, in the place of an earlier value of the key. A null value removes the key.
+  /// Stores `value` in place of an earlier value of the key. A null value removes the key.
   void set(std::string_view key, Value value);
   /// The same, sharing the key's text.
   template <std::same_as<String> Key>
@@ -265,10 +265,10 @@ class Array {
 
   /// The value at `index`, null beyond the end.
   Value at(std::size_t index) const;
-  /// Replaces the value at `index`; nothing happens beyond the end.
+  /// Replaces the value at `index`; does nothing beyond the end.
   void set(std::size_t index, Value value);
   void append(Value value);
-  /// Removes the value at `index`; nothing happens beyond the end.
+  /// Removes the value at `index`; does nothing beyond the end.
   void remove(std::size_t index);
 
   const Value* begin() const;
@@ -282,7 +282,7 @@ class Array {
   detail::Ref<detail::ArrayRep> rep_;
 };
 
-/// A handle on bytes that may be changed in place.
+/// A handle on bytes that can be changed in place.
 class Data {
  public:
   Data() = default;
@@ -443,12 +443,13 @@ class Dictionary::Iterator {
 
 // -- Copies -------------------------------------------------------------------------------------
 
-/// A new container with the same elements, which it shares. An empty handle gives an empty one.
+/// A new container that shares the elements of the original. An empty handle gives an empty
+/// container.
 Dictionary mutableCopy(const Dictionary& dictionary);
 Array mutableCopy(const Array& array);
 Data mutableCopy(const Data& data);
 
-/// A value that shares nothing that can be changed with the original.
+/// A copy that shares nothing changeable with the original.
 Value deepCopy(const Value& value);
 
 }  // namespace tavrel::plist

@@ -27,7 +27,7 @@ struct ArrayRep : Shared {
 };
 
 /// Entries in the order of insertion. A removed entry stays, with a null value, until half of the
-/// entries are removed ones. Small dictionaries are searched from the front; larger ones have an
+/// entries are removed. Small dictionaries are searched from the front; larger ones have an
 /// open-addressing table of entry numbers.
 struct DictionaryRep : Shared {
   DictionaryRep() : Shared(Kind::Dictionary) {}

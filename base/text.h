@@ -1,8 +1,8 @@
 // The text of values as people and the receiving side read it.
 //
-// Strings and numbers stand plain, booleans as 1 and 0, dates as "2026-11-16 18:02:18 +0000", data
-// as hexadecimal in angle brackets, containers on one line in JSON's manner, in which strings,
-// dates and data are quoted. A null object is "(null)".
+// Strings and numbers are plain, booleans are 1 and 0, dates "2026-11-16 18:02:18 +0000", data
+// hexadecimal in angle brackets. Containers are on one line in JSON's manner, with strings, dates
+// and data quoted. A null object is "(null)".
 #pragma once
 
 #include <cstdint>
@@ -13,14 +13,14 @@
 
 namespace tavrel {
 
-/// The shortest decimal text that reads back to the same double. Integers up to 2^53 are written
-/// out, so that a double and an integer of the same value have one text. Ends of the range are
-/// "inf" and "-inf", negative zero is "-0", not-a-number is "nan" whatever its sign.
+/// The shortest decimal text that reads back to the same double. Integers up to 2^53 have no
+/// exponent, so that a double and an integer of the same value have the same text. The infinities
+/// are "inf" and "-inf", negative zero is "-0", not-a-number is "nan" whatever its sign.
 std::string numberText(double value);
 std::string numberText(const plist::Number& value);
 
-/// "2026-11-16 18:02:18 +0000", in UTC, fractions of a second dropped. Instants that no calendar
-/// reaches are given as a number of seconds since 1970 behind "@".
+/// "2026-11-16 18:02:18 +0000", in UTC, without fractions of a second. Instants beyond the calendar
+/// are "@" and the number of seconds since 1970.
 std::string dateText(plist::Date date);
 
 /// Lower-case hexadecimal, two digits a byte.

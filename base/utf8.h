@@ -9,8 +9,8 @@ namespace tavrel {
 
 inline constexpr char32_t kReplacementCharacter = 0xFFFD;
 
-/// Takes the next code point off the front of `text`, which must not be empty. A byte that begins
-/// no well-formed sequence is taken alone and yields the replacement character.
+/// Takes the next code point off the front of `text`, which must not be empty. A byte that does not
+/// begin a well-formed sequence is taken alone and yields the replacement character.
 char32_t takeCodePoint(std::string_view& text);
 
 /// True when `text` is well-formed UTF-8 (shortest forms, no surrogates).
@@ -19,7 +19,7 @@ bool isValidUtf8(std::string_view text);
 /// Appends a code point; surrogates and numbers beyond U+10FFFF become the replacement character.
 void appendCodePoint(std::string& out, char32_t codePoint);
 
-/// `text` with every malformed byte replaced by the replacement character.
+/// `text` with the replacement character for each malformed byte.
 std::string repairedUtf8(std::string_view text);
 
 }  // namespace tavrel

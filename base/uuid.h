@@ -13,7 +13,7 @@ using UuidBytes = std::array<std::byte, 16>;
 
 std::string uuidText(const UuidBytes& bytes);
 
-/// The same UUID in upper case; nothing for any other text.
+/// The same UUID in upper case; nothing for other texts.
 std::optional<std::string> normalisedUuid(std::string_view text);
 
 }  // namespace tavrel

@@ -1,7 +1,7 @@
 // The whitelist: which statistics keys may leave the device, and how each is coarsened.
 //
-// The file is a property list: a dictionary of groups, each with up to four tables from a key, or
-// the beginning of keys, to that key's options. docs/whitelist.md describes it.
+// The file is a property list: a dictionary of groups, each with up to four tables from keys, or
+// beginnings of keys, to options. docs/whitelist.md describes it.
 #pragma once
 
 #include <memory>
@@ -23,7 +23,7 @@ inline constexpr std::string_view kTaskingSwitchDomain = "com.norvane.da";
 /// The group that only internal devices load.
 inline constexpr std::string_view kInternalTestingGroup = "InternalTesting";
 
-/// Names of the tables of a group. Entries of a group with other names are ignored.
+/// Names of the tables of a group. Other entries of a group are ignored.
 inline constexpr std::string_view kScalarKeysTable = "ScalarKeys";
 inline constexpr std::string_view kScalarPrefixesTable = "ScalarKeyPrefixes";
 inline constexpr std::string_view kDistributionKeysTable = "DistributionKeys";
@@ -38,8 +38,8 @@ inline constexpr std::string_view kIntervalsOption = "intervals";
 class BHConfig {
  public:
   /// Reads the whitelist. Null when it cannot be read or parsed; the system log has the reason.
-  /// Where groups list the same key the later one in the file decides. Values of the wrong type
-  /// are passed over.
+  /// When groups list the same key, the later one in the file decides. Values of the wrong type are
+  /// skipped.
   static std::unique_ptr<BHConfig> init(Platform& platform);
 
   /// The options of a key, an empty handle when it may not be reported. An exact entry comes

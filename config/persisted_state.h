@@ -1,4 +1,4 @@
-// Names of the daemon's state in the preferences, for everybody who reads or writes it.
+// Names of the daemon's state in the preferences, for all code that reads or writes it.
 #pragma once
 
 #include <string_view>
@@ -8,7 +8,7 @@ namespace tavrel {
 /// The domain of the daemon's own state. Its service has the same name.
 inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
 
-/// Integer: the last day for which the gated run was done.
+/// Integer: the last day that the gated run has done.
 inline constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
 /// String: the OS version at the last log.
@@ -17,9 +17,8 @@ inline constexpr std::string_view kLastOSVersionKey = "LastOSVersion";
 /// Dictionary: the OS build last seen ("version") and the day of the run that first saw it ("day").
 inline constexpr std::string_view kLastOSUpdateKey = "LastOSUpdate";
 
-/// The tasking that is applied: its identifier, the OS build at which it was applied, its digest
-/// and its settings. The identifier, digest and settings have the same names where a tasking is
-/// scheduled.
+/// The applied tasking: its identifier, the OS build at which it was applied, its digest and its
+/// settings. A scheduled tasking uses the same names for identifier, digest and settings.
 inline constexpr std::string_view kTaskingIDKey = "TaskingID";
 inline constexpr std::string_view kTaskingOSKey = "TaskingOS";
 inline constexpr std::string_view kTaskingDigestKey = "TaskingDigest";

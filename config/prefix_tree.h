@@ -1,4 +1,4 @@
-// Finds the longest of many prefixes that a key begins with, in time that depends on the key's
+// Finds the longest of many prefixes with which a key begins, in time that depends on the key's
 // length and not on the number of prefixes.
 #pragma once
 
@@ -19,18 +19,19 @@ class PrefixTree {
   PrefixTree(PrefixTree&&) = default;
   PrefixTree& operator=(PrefixTree&&) = default;
 
-  /// The longest prefix that `key` begins with, borrowed from the tree; nothing when there is none.
+  /// The longest prefix with which `key` begins, borrowed from the tree; nothing when there is
+  /// none.
   std::optional<std::string_view> longestMatch(std::string_view key) const;
 
  private:
   static constexpr std::uint32_t kNone = 0xFFFF'FFFF;
 
   // A node stands for the text from the root to it, which is the beginning of all prefixes below
-  // it. The children of a node lie side by side. Nodes are small, since a walk goes from one to
-  // the next and looks at texts only at its end.
+  // it. The children of a node are adjacent. Nodes are small, because a walk goes from one to the
+  // next and looks at texts only at its end.
   struct Node {
     std::uint32_t length;   // of the text
-    std::uint32_t longest;  // the longest prefix that the text begins with
+    std::uint32_t longest;  // the longest prefix with which it begins
     std::uint32_t firstChild;
     std::uint32_t childCount;
   };
@@ -39,9 +40,9 @@ class PrefixTree {
   std::size_t childFor(const Node& node, char next) const;
 
   std::vector<std::string> prefixes_;   // sorted, each once
-  std::vector<std::uint32_t> shorter_;  // for each the longest other one that it begins with
+  std::vector<std::uint32_t> shorter_;  // for each, the longest other one that begins it
   std::vector<Node> nodes_;             // the root first
-  std::vector<char> branches_;          // for each node the byte that leads to it
+  std::vector<char> branches_;          // for each node, the byte that leads to it
 };
 
 }  // namespace tavrel

@@ -5,9 +5,9 @@
 
 namespace tavrel {
 
-/// The entries of the log from the elements of "app_data", in their order. An element that is no
-/// dictionary or lacks its identifier, its version or its UUID (16 bytes, or their text) is left
-/// out; a missing number reads as 0.
+/// Makes the log's entries from the elements of "app_data", in their order. Leaves out an element
+/// that is not a dictionary or lacks its identifier, its version or its UUID (16 bytes, or their
+/// text). A missing number reads as 0.
 plist::Array appInfoFrom(const plist::Array& appData);
 
 }  // namespace tavrel

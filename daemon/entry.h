@@ -1,4 +1,4 @@
-// The entry point behind main: what the command line asks for.
+// The entry point that `main` calls: runs what the command line asks for.
 #pragma once
 
 #include <chrono>

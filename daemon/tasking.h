@@ -7,11 +7,11 @@
 namespace tavrel {
 
 /// Notes an OS update, applies a changed tasking, and submits logs at once for a number of days
-/// after an OS update. A tasking that preferences could not remember is told to the system log, and
-/// the one applied before stays.
+/// after an OS update. Refuses a tasking that preferences could not remember, with a line in the
+/// system log; the one applied before stays.
 ///
-/// The daemon's own domain, which remembers what was applied, is synchronised behind all others:
-/// a run that is cut short is repeated as a whole by the next one.
+/// The daemon's own domain, which remembers what was applied, is synchronised last, so that the
+/// next run repeats a run that was cut short as a whole.
 void trackOSChangeAndTasking(Platform& platform);
 
 }  // namespace tavrel

@@ -32,7 +32,7 @@ class PWBundleProxy {
 class PWApplicationWorkspace {
  public:
   virtual ~PWApplicationWorkspace() = default;
-  /// Calls `handler` once for every bundle of the kind.
+  /// Calls `handler` once for each bundle of the kind.
   virtual void enumerateBundles(std::uint32_t kind,
                                 const std::function<void(const PWBundleProxy&)>& handler) = 0;
 };

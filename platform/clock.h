@@ -1,5 +1,5 @@
-// Wall clock and tick counter. The wall clock says which day it is; it may jump. Durations are
-// measured with ticks.
+// Wall clock and tick counter. The wall clock says which day it is, and may jump. Measure durations
+// with ticks.
 #pragma once
 
 #include <cstdint>

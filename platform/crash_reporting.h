@@ -15,7 +15,7 @@ class CrashReporting {
   /// Files one structured diagnostic record under a numeric log type.
   virtual void FLLogStructuredData(std::uint32_t logType, const plist::Dictionary& record) = 0;
 
-  /// Cleans structured-data logs up by age.
+  /// Removes structured-data logs by age.
   virtual void FLDumpAllOldStructuredDataLogs() = 0;
 
   /// Rolls the support log over.
@@ -25,7 +25,7 @@ class CrashReporting {
   virtual std::string hardwareModel() = 0;
   /// "name version (build)".
   virtual std::string osVersion() = 0;
-  /// A new identifier at every call.
+  /// A new identifier for each call.
   virtual std::string incidentIdentifier() = 0;
 };
 

@@ -11,7 +11,7 @@ class DescriptorWriter {
  public:
   virtual ~DescriptorWriter() = default;
 
-  /// One call of the system: how many bytes it took, negative when it failed.
+  /// One system call. Yields how many bytes it took, negative when it failed.
   virtual std::ptrdiff_t write(int descriptor, ByteSpan bytes) = 0;
 };
 

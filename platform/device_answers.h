@@ -18,7 +18,7 @@ class DeviceAnswers {
   /// Null when the device has no answer. The answer is the caller's own.
   virtual plist::Value SQCopyAnswer(std::string_view question) = 0;
 
-  /// The answer when it is a boolean, else false.
+  /// The answer when it is a boolean, otherwise false.
   bool SQGetBoolAnswer(std::string_view question) {
     return SQCopyAnswer(question).boolean().value_or(false);
   }

@@ -1,7 +1,7 @@
-// The packed form in which the values of a distribution are kept and handed on.
+// The packed form in which the values of a distribution are stored and passed on.
 //
 // A record has 12 bytes: the double's 64 bits, then the offset in seconds within the day, both
-// little-endian. Records stand side by side in the order of recording, at any address.
+// little-endian. Records are adjacent, in the order of recording, at any alignment.
 #pragma once
 
 #include <bit>

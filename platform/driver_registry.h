@@ -24,10 +24,10 @@ class DriverService {
 
   /// A property of the service; null when absent. The value is the caller's own.
   virtual plist::Value property(std::string_view key) = 0;
-  /// The same, searched on the service and up through its parents in a plane.
+  /// The same, searched for on the service and up through its parents in a plane.
   virtual plist::Value searchProperty(std::string_view plane, std::string_view key) = 0;
 
-  /// Opens a user client for the own task. `client` stays empty on failure.
+  /// Opens a user client for this task. `client` stays empty on failure.
   virtual KernelReturn open(std::uint32_t type, std::unique_ptr<UserClient>& client) = 0;
 };
 
@@ -35,7 +35,7 @@ class DriverService {
 class ServiceIterator {
  public:
   virtual ~ServiceIterator() = default;
-  /// False once the registry has changed under the walk.
+  /// False once the registry has changed during the walk.
   virtual bool isValid() = 0;
   /// Null when none is left.
   virtual std::shared_ptr<DriverService> next() = 0;

@@ -1,4 +1,4 @@
-// Libraries that are loaded while the program runs, and the functions that they offer.
+// Libraries loaded at run time, and the functions that they offer.
 #pragma once
 
 #include <cstdint>

@@ -15,8 +15,8 @@ class EventLoop {
 
   virtual ~EventLoop() = default;
 
-  /// Waits for events until one has been handled or the time is over, in its full length also
-  /// when there is nothing to wait for.
+  /// Waits until an event has been handled or the time is over, for its full length even when there
+  /// are no event sources.
   virtual Slice runSlice(std::chrono::milliseconds longest) = 0;
 };
 

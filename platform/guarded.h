@@ -1,4 +1,4 @@
-// For work whose failure must not stop what comes behind it, such as that of destructors.
+// For work whose failure must not stop what follows it, such as that of destructors.
 #pragma once
 
 #include <exception>
@@ -7,7 +7,8 @@
 
 namespace tavrel {
 
-/// Runs `action` and logs what it throws, for want of memory most likely, as "cannot WHAT: reason".
+/// Runs `action` and logs what it throws, most likely because memory is short, as "cannot WHAT:
+/// reason".
 template <class Action>
 void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
   try {
@@ -17,7 +18,7 @@ void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
       log.log(LogLevel::Error, "cannot %s: %s", what, failure.what());
     }
   } catch (...) {
-    // Without memory for a line there is nobody left to tell.
+    // There is no memory left even for the line.
   }
 }
 

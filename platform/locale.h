@@ -15,7 +15,7 @@ class Locale {
   virtual std::vector<std::string> preferredLanguages() = 0;
   virtual std::vector<std::string> systemLanguages() = 0;
 
-  /// Those of `available` that suit `preferred`, best first.
+  /// The languages of `available` that suit `preferred`, best first.
   virtual std::vector<std::string> matchLocalizations(
       const std::vector<std::string>& available, const std::vector<std::string>& preferred) = 0;
 

@@ -16,13 +16,13 @@ class PeerConnection {
   using EventHandler = std::function<void(const plist::Value&)>;
 
   virtual ~PeerConnection() = default;
-  /// Called for each event: a dictionary is a message, null an error or the closure.
+  /// Called for each event: a dictionary is a message, null an error or the end of the peer.
   virtual void setEventHandler(EventHandler handler) = 0;
-  /// Begins to deliver events.
+  /// Starts delivering events.
   virtual void resume() = 0;
 };
 
-/// Closes the service when it is released.
+/// Closes the service when released.
 class ServiceListener {
  public:
   using PeerHandler = std::function<void(PeerConnection&)>;
@@ -36,7 +36,7 @@ class ServiceListener {
 class NamedServices {
  public:
   virtual ~NamedServices() = default;
-  /// Null when the listener cannot be made. That is not reported; a debug message has the reason.
+  /// Null when the listener cannot be made; only a debug message gives the reason.
   virtual std::unique_ptr<ServiceListener> createListener(std::string_view name) = 0;
 };
 

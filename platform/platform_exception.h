@@ -1,7 +1,7 @@
 // The exception that services of the platform raise.
 //
-// Services answer failures in their results. This kind is for what has no place in a result; who
-// guards a piece of work against its services catches it and no other.
+// Services report failures in their results. This exception is for failures that have no place in a
+// result; code that guards its work against services catches this type and no other.
 #pragma once
 
 #include <exception>

@@ -16,28 +16,28 @@ class Preferences {
  public:
   virtual ~Preferences() = default;
 
-  /// Bytes of a value as XML, with its key: no sender may fill a domain that others share with a
-  /// single value.
+  /// Bytes of a value as XML, with its key: nobody may fill a shared domain with a single value.
   static constexpr std::size_t kLargestChange = 1U << 20;
 
   /// Null when the key is absent or its domain cannot be read.
   virtual plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) = 0;
 
-  /// Stores `value`; a null value removes the key. One that has no form as XML or needs more than
-  /// `kLargestChange` is dropped, with a line in the system log when the domain is synchronised.
+  /// Stores `value`; a null value removes the key. A value that has no form as XML or needs more
+  /// than `kLargestChange` is dropped, with a line in the system log when the domain is
+  /// synchronised.
   virtual void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                                       std::string_view domain) = 0;
 
-  /// Writes the domain through to storage and takes in what other processes have written. False
-  /// when the domain could not be written; its changes are then kept for the next attempt.
+  /// Writes the domain to storage and reads what other processes have written. False when the
+  /// domain could not be written; its changes are then kept for the next attempt.
   virtual bool ZTXPreferencesSynchronize(std::string_view domain) = 0;
 
-  /// The value as an integer, 0 when it is absent or no number. `keyExistsAndHasValidFormat`
+  /// The value as an integer, 0 when it is absent or not a number. `keyExistsAndHasValidFormat`
   /// tells the cases apart.
   std::int64_t ZTXPreferencesGetIntegerValue(std::string_view key, std::string_view domain,
                                              bool* keyExistsAndHasValidFormat = nullptr);
 
-  /// The value when it is a boolean, else false.
+  /// The value when it is a boolean, otherwise false.
   bool ZTXPreferencesGetBoolValue(std::string_view key, std::string_view domain,
                                   bool* keyExistsAndHasValidFormat = nullptr);
 };

@@ -1,4 +1,4 @@
-// State that lives as long as the process. Main owns it, `Platform` carries it.
+// State that lives as long as the process. `main` owns it, `Platform` carries it.
 #pragma once
 
 #include <optional>
@@ -8,10 +8,10 @@
 namespace tavrel {
 
 struct ProcessState {
-  /// A client announced app information that it has not delivered yet.
+  /// A client has announced app information and not delivered it yet.
   bool appInfoRequested = false;
 
-  /// A client's announcement or forced day has been acted upon; no further one is.
+  /// The process has acted on a client's announcement or forced day, and ignores further ones.
   bool clientRequestHandled = false;
 
   /// The device-answers query "InternalBuild", asked once.

@@ -1,4 +1,4 @@
-// A reference to a service that never is null and can be made to name another one.
+// A reference to a service. It is never null and can be set to another service.
 #pragma once
 
 namespace tavrel {

@@ -1,4 +1,4 @@
-// Standard output and standard error, byte for byte, without a line end of their own.
+// Standard output and standard error, byte for byte; no line ends are added.
 #pragma once
 
 #include <string_view>

@@ -1,7 +1,7 @@
 // The device's statistics store: named scalars and distributions, kept per day.
 //
-// `StatisticsStore` is the client that writes and knows the calendar; `BHHistory` reads what was
-// kept. A day is a number of days since 1970-01-01, UTC.
+// `StatisticsStore` is the client that writes and knows the calendar; `BHHistory` reads. A day is
+// the number of days since 1970-01-01 UTC.
 #pragma once
 
 #include <cstddef>
@@ -16,12 +16,12 @@
 
 namespace tavrel {
 
-/// The preference that counts the stores which were found damaged and set aside.
+/// The preference that counts stores that were found damaged and set aside.
 inline constexpr std::string_view kStoreCorruptionsDomain = "com.norvane.tallied";
 inline constexpr std::string_view kStoreCorruptionsKey = "DatabaseCorruptionCount";
 
 /// Yields the values of one distribution row in the order in which they were recorded. Values are
-/// fetched from the store in blocks, and only when asked for.
+/// fetched from the store in blocks, and only on demand.
 class BHHistoryDistributionEnumerator {
  public:
   using Sample = DistributionSample;
@@ -43,8 +43,8 @@ class BHHistoryDistributionEnumerator {
     return true;
   }
 
-  /// The packed records (platform/distribution_record.h) of the next values, for those who want
-  /// many at once; empty when none is left. They stay valid until more is asked for.
+  /// The packed records (platform/distribution_record.h) of the next values, for callers that want
+  /// many at once; empty when none is left. They stay valid until the next call.
   std::string_view nextRecords() {
     if (next_ != end_) {
       const char* const first = std::exchange(next_, end_);
@@ -58,10 +58,10 @@ class BHHistoryDistributionEnumerator {
   bool failed() const { return failed_; }
 
  protected:
-  /// The packed records of the next values, whole ones, which stay valid until the next call; empty
-  /// when none is left.
+  /// The packed records of the next values, whole ones, valid until the next call; empty when none
+  /// is left.
   virtual std::string_view nextBlock() = 0;
-  /// To be called before `nextBlock` yields nothing for a failure.
+  /// Call this before `nextBlock` yields nothing because of a failure.
   void fail() { failed_ = true; }
 
  private:
@@ -70,10 +70,10 @@ class BHHistoryDistributionEnumerator {
   bool failed_ = false;
 };
 
-/// A reader of the store. Queries select the rows whose key begins with the prefix and whose day
-/// lies above `minDaysSince1970` and not above `maxDaysSince1970`. Rows arrive ordered by key
+/// A reader of the store. Queries select the rows whose key begins with the prefix and whose day is
+/// greater than `minDaysSince1970` and at most `maxDaysSince1970`. Rows arrive ordered by key
 /// (bytewise), then by day, before the query returns; the handler may set `stop` to end it early.
-/// Bounds are wider than days, so that the day before the first one can be named.
+/// Bounds are wider than days, so that they can express the day before the first one.
 class BHHistory {
  public:
   using ScalarRowHandler =
@@ -109,8 +109,8 @@ class StatisticsStore {
   /// the end of the run.
   virtual void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
 
-  /// The history at its default location. A store that cannot be read has been reported to the
-  /// system log and gives a history without rows.
+  /// The history at its default location. A store that cannot be read is reported to the system log
+  /// and gives a history without rows.
   virtual std::unique_ptr<BHHistory> initWithDefaultPath() = 0;
 };
 

@@ -1,4 +1,4 @@
-// Following a run from step to step.
+// Follows a run from step to step.
 #pragma once
 
 #include <functional>
@@ -6,7 +6,7 @@
 
 namespace tavrel {
 
-/// Called with the name of each step as it begins. Empty when nobody follows.
+/// Called with the name of each step as it begins. May be empty.
 using StepObserver = std::function<void(std::string_view step)>;
 
 inline void beginStep(const StepObserver& observer, std::string_view step) {

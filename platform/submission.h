@@ -1,4 +1,4 @@
-// The diagnostic-log submission service: may logs leave the device, and the way out for them.
+// The diagnostic-log submission service: whether logs may leave the device, and how they do.
 #pragma once
 
 #include <functional>
@@ -31,8 +31,8 @@ class SubmissionService {
   virtual bool hasInternalDiagnostics(std::string_view identifier) = 0;
 
   /// Files a log for upload: opens it, has `writer` fill it, and makes it appear in one step. An
-  /// empty `options` handle means none. False when the log could not be filed; nothing of it is
-  /// then left, and the system log has the reason.
+  /// empty `options` handle means none. False when the log could not be filed; it then leaves
+  /// nothing behind, and the system log has the reason.
   virtual bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
                                         const plist::Dictionary& options,
                                         const LogWriter& writer) = 0;

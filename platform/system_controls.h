@@ -17,7 +17,7 @@ class SystemControls {
 
   virtual ~SystemControls() = default;
 
-  /// Reads a control's value into `buffer`. A value that is longer fails with ENOMEM.
+  /// Reads a control's value into `buffer`. A longer value fails with ENOMEM.
   virtual Result read(std::string_view name, MutableByteSpan buffer) = 0;
 };
 

@@ -1,4 +1,4 @@
-// What system the device runs.
+// The system that the device runs.
 #pragma once
 
 #include <string_view>
@@ -14,7 +14,7 @@ inline constexpr std::string_view kProductBuildVersionKey = "ProductBuildVersion
 class SystemVersion {
  public:
   virtual ~SystemVersion() = default;
-  /// Strings under the keys above; a key that is not known is absent.
+  /// Strings under the keys above; unknown ones are absent.
   virtual plist::Dictionary systemVersionDictionary() = 0;
 };
 

@@ -11,14 +11,14 @@
 
 namespace tavrel {
 
-/// Memory that the driver shares with the process, unmapped when it is released.
+/// Memory that the driver shares with the process, unmapped when released.
 class MappedMemory {
  public:
   virtual ~MappedMemory() = default;
   virtual ByteSpan bytes() const = 0;
 };
 
-/// Closed when it is released; `close` does so earlier and tells how it went.
+/// Closed when released; `close` does so earlier and returns the status.
 class UserClient {
  public:
   virtual ~UserClient() = default;
@@ -31,7 +31,7 @@ class UserClient {
                                   MutableByteSpan structureOutput,
                                   std::size_t& structureOutputLength) = 0;
 
-  /// Maps a memory type into the own task, anywhere.
+  /// Maps a memory type into this task, at any address.
   virtual KernelReturn mapMemory(std::uint32_t memoryType,
                                  std::unique_ptr<MappedMemory>& mapped) = 0;
 

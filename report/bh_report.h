@@ -1,9 +1,9 @@
 // The report of one day: the whitelisted statistics of that day, coarsened, with what the daemon
-// measures itself, in one property list that is handed to the submission service.
+// measures itself, in one property list for the submission service.
 //
 //   BHReport(platform).writeLogForYesterday(day, appInfo);
 //
-// One report is made per daily run, written once and dropped.
+// A daily run makes one report, writes it once and drops it.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// Under which the submission service files the log.
+/// The type and name under which the submission service files the log.
 inline constexpr std::string_view kTalliedLogType = "193";
 inline constexpr std::string_view kTalliedLogName = "log-tallied";
 
@@ -31,8 +31,8 @@ class BHReport {
   /// applications, an empty handle when the caller has none.
   void writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo);
 
-  /// Adds the probes to what was collected, builds the log and submits it. A report in which
-  /// nothing was collected does nothing.
+  /// Adds the probes to what was collected, builds the log and submits it. Does nothing when
+  /// nothing was collected.
   void serializeWithDate(std::int32_t day, const plist::Array& andAppInfo);
 
   // Scalars.
@@ -41,23 +41,24 @@ class BHReport {
   std::int64_t addScalar(std::int64_t value, std::string_view forKey,
                          const plist::Dictionary& withOptions);
 
-  /// Adds a scalar whose value is costly: the block runs only when the key is whitelisted.
+  /// Adds a scalar that is costly to measure: the block runs only when the key is whitelisted.
   void addScalarForKey(std::string_view key, const std::function<std::int64_t()>& byExecutingBlock);
 
   // Distributions.
 
-  /// Stores the summary of the values, and their histogram when the options have "intervals".
-  /// Values that cannot all be read give no entry.
+  /// Stores the summary of the values, and their histogram when the options have "intervals". Adds
+  /// no entry when some values cannot be read.
   void computeAndAddDistribution(BHHistoryDistributionEnumerator& values, std::string_view forKey,
                                  const plist::Dictionary& withOptions);
 
   // Probes: what the daemon measures itself. Each scalar is measured only when it is whitelisted.
 
-  /// Counts of installed applications, of all and of those that the user installed.
+  /// Counts of all installed applications and of those that the user installed.
   void addInstalledAppInfo();
-  /// Languages and region, without regard to the whitelist.
+  /// Languages and region, whatever the whitelist says.
   void addMetadataKeys();
-  /// Size of the statistics database in MiB, and how often it was found corrupt since last asked.
+  /// Size of the statistics database in MiB, and how often it was found corrupt since the last
+  /// report.
   void reportDatabaseSize();
   /// Minutes since the device started.
   void reportCPUUptime();

@@ -1,11 +1,11 @@
-// The two preference functions that are looked up in a dynamically loaded library.
+// The two preference functions of a dynamically loaded library.
 #pragma once
 
 #include "platform/platform.h"
 
 namespace tavrel {
 
-/// Looks up what is still unknown of the two functions in `ProcessState`. False when either is
+/// Looks up those of the two functions that `ProcessState` does not hold yet. False when one is
 /// missing; the system log then says which.
 bool findFaultlinePreferences(Platform& platform);
 

@@ -1,8 +1,8 @@
 // Histograms over explicit bucket boundaries.
 //
 // Bucket i counts the values x with b(i-1) < x <= b(i); the last one counts those above all
-// boundaries, and not-a-number. Boundaries may stand in any order: the first one, in their order,
-// that is not less than a value decides.
+// boundaries, and not-a-number. Boundaries may be in any order: the first one in the list that is
+// not less than a value decides.
 #pragma once
 
 #include <cstdint>
@@ -15,7 +15,7 @@
 
 namespace tavrel {
 
-/// The index of the bucket of `value`, by a walk over boundaries as they stand in the whitelist.
+/// The index of the bucket of `value`, by a walk over boundaries in the order of the whitelist.
 std::uint32_t determineHistBucketForValue(double value, const plist::Array& withIntervals);
 
 /// Labels and counts of the buckets that counted something; an empty handle when none did.
@@ -32,15 +32,15 @@ class Histogram {
   void count(double value) { ++counts_[bucketOf(value)]; }
   std::span<const std::uint32_t> counts() const { return counts_; }
 
-  /// The same index as `determineHistBucketForValue` gives.
+  /// The index that `determineHistBucketForValue` gives.
   std::uint32_t bucketOf(double value) const;
 
  private:
   Histogram() = default;
 
-  // The boundaries that can decide: those above all boundaries before them. They ascend, so that
-  // a search by halving finds the one at which the walk stops. With each its index in the
-  // whitelist's order, and last the index of the bucket above them all.
+  // The boundaries that can decide: those above all boundaries before them. They ascend, so that a
+  // search by halving finds the one at which the walk stops. `indexes_` has the position of each in
+  // the whitelist, and last the index of the bucket above all.
   std::vector<double> ends_;
   std::vector<std::uint32_t> indexes_;
   std::vector<std::uint32_t> counts_;
