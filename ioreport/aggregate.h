@@ -1,4 +1,4 @@
-// The aggregate: a collection of channels, and what all the library's operations work on.
+// The aggregate: a collection of channels, on which all of the library's operations work.
 //
 //   auto aggregate = IOReportCreateAggregate(kOptionGroupByDriver);
 //   IOReportAddChannelDescription(aggregate, driverID, "disk <id 0x1234>", channelID, type,
@@ -6,8 +6,8 @@
 //
 // It is a tree of dictionaries. Each level holds an array of channels and, by name, levels of
 // single drivers and groups; the top level also holds the options by which channels are filed. A
-// channel stands in one place, at the deepest level that the options and its names select. Channels
-// are filed by reference: whoever else holds one sees what changes in it.
+// channel is filed in one place, at the deepest level that the options and its names select.
+// Channels are filed by reference: all holders of one see its changes.
 #pragma once
 
 #include <cstdint>
@@ -29,7 +29,7 @@ plist::Dictionary IOReportCreateAggregate(std::int32_t options);
 /// The options, 0 when there are none.
 std::int32_t _getAggregateOpts(const plist::Dictionary& aggregate);
 
-/// A channel info with nothing but a unit; an empty handle when memory is short.
+/// A channel info that has only a unit; an empty handle when memory is short.
 plist::Dictionary IOReportCreateUnitInfo(std::uint64_t unit);
 
 /// Builds a channel from its parts and files it.
@@ -45,8 +45,8 @@ KernelReturn IOReportAddChannelDescription(const plist::Dictionary& aggregate,
 KernelReturn _addChannel(const plist::Dictionary& aggregate, const plist::Dictionary& channel,
                          std::int32_t options, ErrorOut error);
 
-/// The dictionary under a key, which is made when there is nothing; an empty handle when there is
-/// something else.
+/// The dictionary under a key, made when the key is absent; an empty handle when the key has
+/// another value.
 plist::Dictionary getOrCreateSubDictionary(plist::Dictionary dictionary, std::string_view key);
 
 }  // namespace tavrel

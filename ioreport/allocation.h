@@ -1,15 +1,15 @@
-// Memory that is short: an answer of the library, not an exception of its caller's.
+// Turns short memory into a result of the library, instead of an exception for its caller.
 //
-// So it is for what the library builds: legends, channels, aggregates, samples, deltas, lists of
-// interests, descriptions, and what getters keep. What printing and the services of the platform
-// throw passes through, and so does what making a callback throws on the caller's side.
+// This covers what the library builds: legends, channels, aggregates, samples, deltas, lists of
+// interests, descriptions, and what getters cache. Exceptions of printing and of the platform's
+// services pass through, and so do those of making a callback on the caller's side.
 #pragma once
 
 #include <new>
 
 namespace tavrel {
 
-/// What `make` returns, or an empty one of the same type when memory is short.
+/// What `make` returns, or an empty value of the same type when memory is short.
 template <class Make>
 auto madeOrNull(const Make& make) -> decltype(make()) {
   try {

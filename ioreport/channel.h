@@ -2,9 +2,9 @@
 // it is called.
 //
 // A channel's legend is an array of its id, its type and, if it has one, its name. It belongs to
-// whoever published it and is shared between the channel, its copies and its samples; therefore
-// `setChannelType` gives the channel a legend of its own before it changes it. The getters keep
-// what they worked out in the channel, and answer texts that are borrowed from it.
+// its publisher and is shared between the channel, its copies and its samples, so `setChannelType`
+// gives the channel a legend of its own before changing it. The getters cache their results in the
+// channel and return texts borrowed from it.
 //
 // Every 64-bit quantity that is absent or unreadable reads as `kInvalidValue`.
 #pragma once
@@ -22,7 +22,7 @@ namespace tavrel {
 
 inline constexpr std::int64_t kInvalidValue = std::numeric_limits<std::int64_t>::min();
 
-/// The first byte of a channel type: how the values of its elements are laid out.
+/// The first byte of a channel type: the layout of its elements' values.
 inline constexpr std::uint8_t kFormatUnknown = 0;
 inline constexpr std::uint8_t kFormatSimple = 1;
 inline constexpr std::uint8_t kFormatState = 2;
@@ -41,8 +41,8 @@ constexpr std::uint16_t elementCountOf(std::uint64_t channelType) {
   return static_cast<std::uint16_t>(channelType >> 32);
 }
 
-/// A number as a signed 64-bit integer; an unsigned one keeps its bits. A real number that is not
-/// whole, or beyond 64 bits, has none.
+/// A number as a signed 64-bit integer; an unsigned one keeps its bits. Nothing for a real number
+/// that is not whole or exceeds 64 bits.
 std::int64_t integerOf(const std::optional<plist::Number>& number);
 
 /// A new legend; an empty handle when memory is short.
@@ -56,13 +56,13 @@ plist::Dictionary createChannel(std::uint64_t driverID, std::string_view driverN
                                 const plist::Value& subGroup, const plist::Dictionary& channelInfo,
                                 ErrorOut error);
 
-/// A channel that differs from another one in its legend only. All else is shared, down to the
-/// texts of the keys, so that the channels of a large legend are small.
+/// A channel that differs from another one only in its legend. It shares everything else, down to
+/// the texts of the keys, so that the channels of a large legend are small.
 plist::Dictionary createSiblingChannel(const plist::Dictionary& sibling,
                                        const plist::Array& legendChannel, ErrorOut error);
 
 KernelReturn getChannelType(const plist::Dictionary& channel, std::uint64_t& channelType);
-/// A legend that has no type yet gets one.
+/// A legend without a type gets one.
 KernelReturn setChannelType(const plist::Dictionary& channel, std::uint64_t channelType);
 
 std::uint8_t IOReportChannelGetFormat(const plist::Dictionary& channel);
@@ -74,14 +74,14 @@ std::int64_t IOReportChannelGetUnit(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetDriverName(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetGroup(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetSubGroup(const plist::Dictionary& channel);
-/// The name in the legend, else the id when it spells one.
+/// The name in the legend, otherwise the id when it spells one.
 std::optional<std::string_view> IOReportChannelGetChannelName(const plist::Dictionary& channel);
 
-/// The printable characters that an id consists of, from its highest byte down and without zero
+/// The printable characters of which an id consists, from its highest byte down and without zero
 /// bytes; nothing when a byte is not printable or all are zero.
 std::optional<std::string> _copyPrintableIDString(std::uint64_t id);
 
-/// Stores what a getter worked out, and answers the stored text.
+/// Stores a getter's result and returns the stored text.
 std::string_view keepText(plist::Dictionary channel, std::string_view key,
                           const plist::Value& text);
 

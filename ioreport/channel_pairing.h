@@ -1,9 +1,10 @@
 // Pairs the channels of one array with those of another.
 //
-// A channel is first compared with that at its own index. Otherwise the others are searched
-// forward, from behind the last one that a search found, or, before any was found, from behind the
-// channel's own index; positions before are never searched again, so that channels pair in order.
-// The first search sorts the others by what identifies them, so that many searches stay cheap.
+// A channel is first compared with that at its own index. If they differ, a search goes forward
+// through the others: from after the last one that a search found, or, if none has been found, from
+// after the channel's own index. Earlier positions are never searched again, so that channels pair
+// in order. The first search sorts the others by what identifies them, so that many searches stay
+// cheap.
 #pragma once
 
 #include <compare>
@@ -21,7 +22,7 @@ class ChannelPairing {
   explicit ChannelPairing(const plist::Array& others) : others_(others) {}
 
   /// Sets the match of the channel at `index`, an empty handle when it has none. False when a type
-  /// cannot be read. Indexes are asked for in ascending order.
+  /// cannot be read. Call with ascending indexes.
   bool find(std::size_t index, const plist::Dictionary& channel, plist::Dictionary& match);
 
  private:

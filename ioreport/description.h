@@ -3,8 +3,8 @@
 //   const auto text = IOReportSampleCopyDescription(channel, 0, "  ");
 //   if (text) std::fputs(text->c_str(), stdout);
 //
-// Names and labels that a channel does not have are shown as "(null)". A description is whole or
-// it is nothing; one that would not fit the memory that a device may claim is nothing.
+// Missing names and labels are shown as "(null)". A description is whole or absent; one that
+// exceeds the memory that a device may claim is absent.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// One line: what the channel is. The prefix stands at its beginning; the options are not read.
+/// One line that says what the channel is, beginning with the prefix. The options are ignored.
 std::optional<std::string> IOReportChannelCopyDescription(const plist::Dictionary& channel,
                                                           std::uint32_t options,
                                                           const char* linePrefix);
@@ -28,8 +28,8 @@ std::optional<std::string> IOReportSampleCopyDescription(const plist::Dictionary
                                                          std::uint32_t options,
                                                          const char* linePrefix);
 
-/// Writes a text, up to its first zero byte, with a single call. A short write is an underrun and
-/// not made up for.
+/// Writes a text, up to its first zero byte, with a single call. A short write is an underrun; the
+/// rest is not written.
 KernelReturn IOReportWriteStringUTF8(DescriptorWriter& writer, int descriptor,
                                      std::optional<std::string_view> string);
 

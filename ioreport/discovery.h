@@ -1,12 +1,12 @@
-// Finding the channels that drivers publish.
+// Finds the channels that drivers publish.
 //
 //   std::optional<ErrorObject> error;
 //   auto channels = IOReportCopyAllChannels(drivers, streams, kOptionGroupByDriver, &error);
 //
 // A driver that takes part has the property "IOReportLegendPublic", and the property
-// "IOReportLegend": an array of group entries, each a dictionary with the channels of one group.
-// Whoever asks for a driver gets its channels whatever the value of the first is; a search of all
-// drivers finds those where it is true. Aggregates that are handed out are the caller's own.
+// "IOReportLegend": an array of group entries, each a dictionary with the channels of one group. A
+// query for one driver gets its channels whatever the value of the first property is; a search of
+// all drivers finds those where it is true. Returned aggregates are the caller's own.
 #pragma once
 
 #include <cstdint>
@@ -26,35 +26,35 @@ namespace tavrel {
 plist::Dictionary IOReportCopyChannelsForDriver(DriverService* service, std::int32_t options,
                                                 ErrorOut error);
 
-/// The channels of every service that matches; a driver without a legend fails them all.
+/// The channels of all services that match; fails when one driver has no legend.
 plist::Dictionary IOReportCopyChannelsForDrivers(DriverRegistry& drivers,
                                                  const plist::Dictionary& matching,
                                                  std::int32_t options, ErrorOut error);
 
-/// The channels of every driver that publishes some. A driver that fails is passed over, and
-/// printed when the options have `kOptionPrintErrors`.
+/// The channels of all drivers that publish some. Skips a driver that fails, and prints it when the
+/// options have `kOptionPrintErrors`.
 plist::Dictionary IOReportCopyAllChannels(DriverRegistry& drivers, StandardStreams& streams,
                                           std::int32_t options, ErrorOut error);
 
-/// For every service that matches a channel of that id, whether it publishes one or not. Its type
-/// is unknown until it is sampled.
+/// A channel of that id for each service that matches, whether or not the service publishes one.
+/// Its type is unknown until it is sampled.
 plist::Dictionary IOReportCopyChannelsWithID(DriverRegistry& drivers,
                                              const plist::Dictionary& matching,
                                              std::uint64_t channelID, ErrorOut error);
 
-/// "NAME <id 0x1234>"; nothing when the service does not tell either.
+/// "NAME <id 0x1234>"; nothing when the service has neither.
 std::optional<std::string> IOReportCopyDriverName(DriverService& service);
 
 /// "NAME <pid 123>".
 std::string IOReportCopyCurrentProcessName(Process& process);
 
-/// Calls back for each service that matches until one does not answer 0, and answers what that one
-/// did. A walk that the registry changed under is aborted, not begun again.
+/// Calls back for each service that matches until a callback returns something other than 0, which
+/// is the result. When the registry changes meanwhile, the walk is aborted, not repeated.
 KernelReturn iterateMatchingServices(DriverRegistry& drivers, const plist::Dictionary& matching,
                                      const std::function<KernelReturn(DriverService&)>& callback);
 
-/// Files the channels of a legend. It ends, with what was filed, at the first group entry that is
-/// malformed; within a group the rest is passed over behind the first channel that is no array.
+/// Files the channels of a legend. Stops at the first malformed group entry and keeps what was
+/// filed; within a group, skips the rest from the first channel that is not an array.
 KernelReturn _addLegendChannels(const plist::Dictionary& aggregate, DriverService& service,
                                 const plist::Array& legend, std::int32_t options, ErrorOut error);
 

@@ -20,8 +20,8 @@
 
 namespace tavrel {
 
-/// What the four values of an element are: of a simple channel the first is its value, and of an
-/// array all four are.
+/// The meaning of an element's four values: in a simple channel the first is the value, in an array
+/// all four are.
 inline constexpr std::size_t kSimpleValue = 0;
 
 inline constexpr std::size_t kBucketHits = 0;  // of a histogram's bucket
@@ -33,16 +33,16 @@ inline constexpr std::size_t kStateID = 0;  // of a state; its fourth value is n
 inline constexpr std::size_t kStateInTransitions = 1;
 inline constexpr std::size_t kStateResidency = 2;
 
-/// A view on the elements in a buffer, which may be written through. It borrows the buffer. The
-/// count ends at 16 bits: only that many low bits of it are kept. Only values may be asked for of
-/// an element that is not there; they are invalid.
+/// A view of the elements in a buffer, through which they can be written. It borrows the buffer.
+/// Only the low 16 bits of the count are kept. Of a missing element, ask only for values; they are
+/// invalid.
 class Elements {
  public:
   Elements() = default;
   explicit Elements(MutableByteSpan bytes)
       : bytes_(bytes), count_(static_cast<std::uint16_t>(bytes.size() / kElementBytes)) {}
 
-  /// False for a channel without readable elements, as opposed to a view on none.
+  /// False for a channel without readable elements; true for a view of zero elements.
   explicit operator bool() const { return bytes_.data() != nullptr; }
   std::size_t count() const { return count_; }
 
@@ -57,7 +57,7 @@ class Elements {
                   static_cast<std::uint64_t>(value));
   }
 
-  /// Takes the bytes of as many elements of `other`, which must have them.
+  /// Copies the bytes of as many elements from `other`, which must have them.
   void copyFrom(const Elements& other) const;
 
  private:
@@ -69,21 +69,22 @@ class Elements {
   std::uint16_t count_ = 0;
 };
 
-/// The elements of a sample whose first element is of the format; else an empty view.
+/// The elements of a sample whose first element has the format; otherwise an empty view.
 Elements getRawElements(const plist::Dictionary& channel, std::uint8_t expectedFormat);
 
-/// The same, when the channel's type too is of that format and, for histograms and states, counts
-/// as many elements.
+/// The same, provided that the channel's type also has that format and, for histograms and states,
+/// counts as many elements.
 Elements elementsOfType(const plist::Dictionary& channel, std::uint8_t format);
 
 /// A value of one element of a channel of that type; invalid when there is none.
 std::int64_t elementValue(const plist::Dictionary& channel, std::uint8_t format, std::int32_t index,
                           std::size_t value);
 
-/// How many elements a channel of that format occupies, by its type; -1 for any other channel.
+/// How many elements a channel of that format occupies according to its type; -1 for other
+/// channels.
 std::int32_t elementCountFor(const plist::Dictionary& channel, std::uint8_t format);
 
-/// For `cloneElements`: every value of the copy becomes `kInvalidValue`.
+/// For `cloneElements`: all values of the copy become `kInvalidValue`.
 inline constexpr std::uint32_t kClearValues = 1U << 0;
 
 /// Gives a channel elements of its own, copied from those of another.

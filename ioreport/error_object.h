@@ -1,12 +1,12 @@
-// How the library tells of failures.
+// How the library reports failures.
 //
-// An operation answers a return code or an empty handle, and says more in an error object when its
-// caller passes a place for one:
+// An operation returns a code or an empty handle, and says more in an error object when its caller
+// passes a place for one:
 //
 //   std::optional<ErrorObject> error;
 //   if (!IOReportCopyChannelsForDriver(service, 0, &error)) log(error->failureReason);
 //
-// The place is written on failure only, and by the outermost operation that has something to say.
+// Only a failure writes the place, by the outermost operation that has something to say.
 #pragma once
 
 #include <cstdint>
@@ -19,7 +19,7 @@
 
 namespace tavrel {
 
-/// The domain of codes that are kernel return codes.
+/// The domain of kernel return codes.
 inline constexpr std::string_view kKernelReturnDomain = "KernelReturn";
 
 struct ErrorObject {
@@ -38,7 +38,7 @@ using ErrorOut = std::optional<ErrorObject>*;
 /// fixed reason when there is no text.
 std::optional<ErrorObject> createCFErr(KernelReturn code, const char* text);
 
-/// Puts an error in its place, if there is one, and answers the code.
+/// Puts an error in its place, if there is one, and returns the code.
 KernelReturn fail(ErrorOut error, KernelReturn code, const char* text);
 
 /// The sign bit of an aggregate's options: errors of single drivers are printed.

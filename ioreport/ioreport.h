@@ -1,5 +1,5 @@
-// The client of the kernel's reporting facility, whole. Drivers publish channels: counters, arrays
-// of them, histograms and times spent in states. The headers in the order in which to read them:
+// The whole client of the kernel's reporting facility. Drivers publish channels: counters, arrays
+// of them, histograms and times spent in states. Read the headers in this order:
 //
 //   error_object.h   how failures are told
 //   channel.h        one channel, and who and what it is
@@ -26,8 +26,8 @@
 //     return kIterateContinue;
 //   });
 //
-// The library keeps nothing between calls. All that it hands out belongs to the caller but what an
-// operation with "Get" in its name answers, which is borrowed from its argument.
+// The library keeps nothing between calls. What it returns belongs to the caller, except for
+// operations with "Get" in their names: their results are borrowed from the argument.
 #pragma once
 
 #include "ioreport/aggregate.h"      // IWYU pragma: export

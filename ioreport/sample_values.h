@@ -1,10 +1,10 @@
-// Reading the values of a sampled channel.
+// Reads the values of a sampled channel.
 //
 //   std::int64_t unit = kInvalidValue;
 //   const std::int64_t reads = IOReportSimpleGetIntegerValue(channel, &unit);
 //   if (reads != kInvalidValue) ...
 //
-// Every accessor looks whether the channel is of its format and the index in range, and answers a
+// Each accessor checks that the channel has its format and the index is in range, and returns a
 // fixed value when not: `kInvalidValue` for values and ids, -1 for counts and indexes, not-a-number
 // for a duty cycle, nothing for a name. None of them copies.
 #pragma once
@@ -38,12 +38,13 @@ std::int64_t IOReportHistogramGetBucketMaxValue(const plist::Dictionary& channel
                                                 std::int32_t bucket);
 std::int64_t IOReportHistogramGetBucketSum(const plist::Dictionary& channel, std::int32_t bucket);
 
-/// Of all buckets that have hits: the minimum of the first, the maximum of the last.
+/// Over all buckets with hits: the minimum of the first, the maximum of the last.
 std::int64_t IOReportHistogramGetMinValue(const plist::Dictionary& channel);
 std::int64_t IOReportHistogramGetMaxValue(const plist::Dictionary& channel);
 
-/// A bucket takes the values above its lower bound up to its upper one. The bounds are worked out
-/// from the channel's configuration once and kept in the channel. Either out-argument may be null.
+/// A bucket takes the values above its lower bound up to its upper one. The bounds are computed
+/// from the channel's configuration once and cached in the channel. Either out-argument may be
+/// null.
 KernelReturn IOReportHistogramGetBucketBounds(const plist::Dictionary& channel, std::int32_t bucket,
                                               std::int64_t* lowerBound, std::int64_t* upperBound);
 
@@ -56,14 +57,14 @@ std::int64_t IOReportStateGetIDForIndex(const plist::Dictionary& channel, std::i
 /// The last state that has the id.
 std::int32_t IOReportStateGetIndexForID(const plist::Dictionary& channel, std::int64_t stateID);
 
-/// What the state's id spells, borrowed from the channel, which keeps the names of all its states.
-/// Nothing when one of them has no name.
+/// The name that the state's id spells, borrowed from the channel, which caches the names of all
+/// its states. Nothing when one of them has no name.
 std::optional<std::string_view> IOReportStateGetNameForIndex(const plist::Dictionary& channel,
                                                              std::int32_t index);
 
 /// How often the state was entered.
 std::int64_t IOReportStateGetInTransitions(const plist::Dictionary& channel, std::int32_t index);
-/// How long it lasted altogether, unsigned, in the channel's unit.
+/// How long it lasted in all, unsigned, in the channel's unit.
 std::int64_t IOReportStateGetResidency(const plist::Dictionary& channel, std::int32_t index);
 /// Its residency as a fraction of that of all states.
 double IOReportStateGetDutyCycle(const plist::Dictionary& channel, std::int32_t index);

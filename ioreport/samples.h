@@ -1,9 +1,9 @@
-// Samples: copies of the subscribed channels that hold the elements which the channels had at one
-// time, under "RawElements".
+// Samples: copies of the subscribed channels that hold, under "RawElements", the elements that the
+// channels had at one time.
 //
-// The elements of one channel stand together in a buffer, in a group; the first one counts them.
-// When two groups are of the same channel, the first counts. Samples own their elements and stay
-// valid after the next update.
+// The elements of one channel form a group in a buffer; the first one counts them. When a channel
+// has two groups, the first one is used. Samples own their elements and stay valid after the next
+// update.
 #pragma once
 
 #include <cstddef>
@@ -19,13 +19,13 @@
 
 namespace tavrel {
 
-/// The current values of subscribed channels. A channel that the kernel left out is left out; an
+/// The current values of subscribed channels. Channels that the kernel left out are missing. An
 /// empty handle when sampling fails.
 plist::Dictionary IOReportCreateSamples(const IOReportSubscription* subscription,
                                         const plist::Dictionary& subscribedChannels,
                                         ErrorOut error);
 
-/// The same from a buffer that the caller has.
+/// The same from the caller's own buffer.
 plist::Dictionary IOReportCreateSamplesRaw(const plist::Dictionary& subscribedChannels,
                                            ByteSpan buffer, ErrorOut error);
 
@@ -35,13 +35,13 @@ class SampleExtractor {
  public:
   explicit SampleExtractor(ByteSpan buffer);
 
-  /// Gives the copy of a channel its elements, and the type that is in them when the channel's own
-  /// is unknown. Answers `kIterateRemove` for a channel that is not in the buffer, and
-  /// `kIterateStop` when it could only stand behind a group of no elements, at which a buffer ends.
+  /// Gives the copy of a channel its elements and, when the channel's own type is unknown, the type
+  /// in them. Returns `kIterateRemove` for a channel that is not in the buffer, and `kIterateStop`
+  /// when the channel could only follow a group of no elements, at which a buffer ends.
   IterateResult extractChannelSample(const plist::Dictionary& channel,
                                      plist::Dictionary& newChannel);
 
-  /// What sampling fails with, if it fails.
+  /// The error with which sampling fails, if it fails.
   KernelReturn status() const { return status_; }
 
  private:

@@ -1,9 +1,9 @@
-// Choosing channels by what they are.
+// Selects channels by their properties.
 //
 //   auto disks = IOReportCopyChannelsInGroup(drivers, streams, "Disks", std::nullopt, 0, &error);
 //
-// The copying operations discover the channels of all drivers first and then prune those that were
-// not asked for; aggregates that are handed out are the caller's own.
+// The copying operations discover the channels of all drivers and then prune the others. Returned
+// aggregates are the caller's own.
 #pragma once
 
 #include <cstdint>
@@ -28,7 +28,7 @@ plist::Dictionary IOReportCopyChannelsOfFormat(DriverRegistry& drivers, Standard
                                                std::uint8_t format, std::int32_t options,
                                                ErrorOut error);
 
-/// The channels of that very unit, scale included.
+/// The channels of exactly that unit, scale included.
 plist::Dictionary IOReportCopyChannelsWithUnit(DriverRegistry& drivers, StandardStreams& streams,
                                                std::uint64_t unit, std::int32_t options,
                                                ErrorOut error);
@@ -39,7 +39,7 @@ plist::Dictionary IOReportCopyChannelsInGroup(DriverRegistry& drivers, StandardS
                                               std::optional<std::string_view> subGroup,
                                               std::int32_t options, ErrorOut error);
 
-/// The same in place: prunes the channels that do not belong there.
+/// The same in place: prunes all other channels.
 IterateResult IOReportSelectChannelsInGroup(const plist::Dictionary& aggregate,
                                             std::optional<std::string_view> group,
                                             std::optional<std::string_view> subGroup,

@@ -1,13 +1,13 @@
-// A subscription: channels whose values the kernel's reporting hub keeps for this process in memory
-// that it shares.
+// A subscription: channels whose values the kernel's reporting hub keeps for this process in shared
+// memory.
 //
 //   plist::Dictionary subscribed;
 //   auto subscription = IOReportCreateSubscription(drivers, nullptr, channels, &subscribed, 0,
 //                                                  &error);
 //   auto samples = IOReportCreateSamples(subscription.get(), subscribed, &error);
 //
-// The hub writes the shared memory only when it is asked to, which `IOReportCreateSamples` does
-// each time. One thread at a time may use a subscription.
+// The hub writes the shared memory only on request; each call of `IOReportCreateSamples` makes one.
+// One thread at a time may use a subscription.
 #pragma once
 
 #include <cstdint>
@@ -24,7 +24,7 @@
 
 namespace tavrel {
 
-/// The connection to the hub, and the buffer that it shares. Both are given back at the end.
+/// The connection to the hub, and the buffer that it shares. Both are released at the end.
 class IOReportSubscription {
  public:
   IOReportSubscription() = default;
@@ -50,19 +50,19 @@ class IOReportSubscription {
   std::uint64_t bufferID_ = 0;  // its low 32 bits are the memory type
 };
 
-/// Subscribes to channels, and hands out a copy of them for sampling, which is the caller's own.
-/// The subscription lives in memory of the allocation context, which must outlive it; null stands
-/// for the default. The reserved value is not read.
+/// Subscribes to channels and returns a copy of them for sampling, which is the caller's own. The
+/// subscription lives in memory of the allocation context, which must outlive it; null means the
+/// default. The reserved value is ignored.
 std::shared_ptr<IOReportSubscription> IOReportCreateSubscription(
     DriverRegistry& drivers, std::pmr::memory_resource* allocationContext,
     const plist::Dictionary& desiredChannels, plist::Dictionary* subscribedChannels,
     std::uint32_t reserved, ErrorOut error);
 
-/// Has the hub write the current elements of all channels into the shared buffer.
+/// Makes the hub write the current elements of all channels into the shared buffer.
 KernelReturn updateKernelBuffer(const IOReportSubscription& subscription, ErrorOut error);
 
-/// The channels of interest as they are sent to the hub; `count` of them make it complete. It takes
-/// memory as it fills.
+/// The list of channels of interest that is sent to the hub; complete with `count` entries. It
+/// takes memory as it fills.
 class InterestList {
  public:
   explicit InterestList(std::size_t count);

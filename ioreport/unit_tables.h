@@ -1,5 +1,5 @@
-// The labels of units. A row gives the scale, which is bits 32-55 of a unit, and the factor word,
-// bits 0-31, that it stands for; both must be met exactly.
+// The labels of units. A row gives the scale (bits 32-55) and the factor word (bits 0-31) of the
+// units that it labels; both must match exactly.
 #pragma once
 
 #include <cstdint>
@@ -13,7 +13,7 @@ struct ScaleLabel {
   std::string_view text;
 };
 
-/// Labels of their own, whatever the quantity.
+/// Complete labels, whatever the quantity.
 inline constexpr ScaleLabel kCompleteLabels[] = {
     {0x000076, 1, "1Gticks"},
     {0x000079, 0x80000018, "24Mticks"},
@@ -21,7 +21,7 @@ inline constexpr ScaleLabel kCompleteLabels[] = {
     {0x020000, 0, "hwpage?"},
 };
 
-/// What stands before the suffix of the quantity.
+/// Prefixes of the quantity's suffix.
 inline constexpr ScaleLabel kUnitPrefixes[] = {
     {0x000073, 0, "p"},   {0x000076, 0, "n"},    {0x000079, 0, "u"},    {0x00007C, 0, "m"},
     {0x000082, 0, "k"},   {0x000085, 0, "M"},    {0x000088, 0, "G"},    {0x00008B, 0, "T"},
@@ -38,7 +38,7 @@ struct QuantitySuffix {
 inline constexpr std::uint8_t kQuantityData = 9;
 inline constexpr std::string_view kUnknownQuantity = "??";
 
-/// Suffixes of all quantities but data, whose suffix depends on the scale.
+/// Suffixes of all quantities except data, whose suffix depends on the scale.
 inline constexpr QuantitySuffix kQuantitySuffixes[] = {
     {0, ""},    // dimensionless
     {1, "s"},   // time

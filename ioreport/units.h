@@ -25,15 +25,15 @@ inline constexpr std::uint64_t kUnitSeconds = std::uint64_t{1} << 56;
 /// "KiB", "ms", "Hz"; nothing for the invalid value.
 std::optional<std::string> copyUnitLabel(std::int64_t unit);
 
-/// The label of the channel's unit, which is kept in the channel, and borrowed from it.
+/// The label of the channel's unit, cached in the channel and borrowed from it.
 std::optional<std::string_view> IOReportChannelGetUnitLabel(const plist::Dictionary& channel);
 
-/// What values of a unit are multiplied and divided by, as unsigned 64-bit words, which wrap. The
-/// factor word is bits 0-31 of the unit, the scale bits 32-55. Fails for special scales.
+/// The factors by which values of a unit are multiplied and divided, as unsigned 64-bit words that
+/// wrap. The factor word is bits 0-31 of the unit, the scale bits 32-55. Fails for special scales.
 KernelReturn getFactorsFromScale(std::uint32_t factorWord, std::uint32_t scale,
                                  std::uint64_t& numerator, std::uint64_t& denominator);
 
-/// Not-a-number when the units are of different quantities or one cannot be converted.
+/// Not-a-number when the units differ in quantity or one cannot be converted.
 double IOReportScaleValue(std::uint64_t value, std::uint64_t fromUnit, std::uint64_t toUnit);
 
 }  // namespace tavrel

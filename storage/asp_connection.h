@@ -4,8 +4,7 @@
 //   if (openASPConnection(drivers, streams, connection)) connection.connection->callMethod(...);
 //   closeASPConnection(connection);
 //
-// What is not closed by name is closed when it goes out of scope. Failures are told on standard
-// error.
+// A connection that goes out of scope is closed. Failures are printed on standard error.
 #pragma once
 
 #include <memory>
@@ -22,12 +21,12 @@ struct ASPConnection {
   const NandExporter* exporter = nullptr;
 };
 
-/// True when the driver is there, could be opened and has statistics of the known format; else the
-/// record is closed again.
+/// True when the driver exists, could be opened and has statistics of the known format; otherwise
+/// the record is closed again.
 bool openASPConnection(DriverRegistry& drivers, StandardStreams& streams,
                        ASPConnection& connection);
 
-/// Harmless on a record that is closed.
+/// Does nothing to a closed record.
 void closeASPConnection(ASPConnection& connection);
 
 /// A connection to the first driver that is present, null when there is none. `exporter` receives
@@ -35,7 +34,7 @@ void closeASPConnection(ASPConnection& connection);
 std::unique_ptr<UserClient> ANDConnect(DriverRegistry& drivers, StandardStreams& streams,
                                        const NandExporter*& exporter);
 
-/// Closes; an empty handle is one whose closing fails.
+/// Closes. Closing an empty handle fails.
 void ANDDisconnect(StandardStreams& streams, std::unique_ptr<UserClient> connection);
 
 /// Whether the controller recommends deleting content.

@@ -1,4 +1,4 @@
-// Where the counters of a NAND chip stand in its 4 KiB block, by generation and maker.
+// Where the counters of a NAND chip are in its 4 KiB block, by generation and maker.
 //
 // The block is read as little-endian words of 32 bits. A row says that elements `first` to `last`
 // of an array take words `firstWord` to `lastWord`, in order. Elements that no row names are 0.

@@ -19,7 +19,7 @@ namespace tavrel {
 inline constexpr std::size_t kCounterBlockBytes = 4096;
 using CounterBlock = std::span<const std::byte, kCounterBlockBytes>;
 
-/// Fills the whole record: what the block does not tell is 0.
+/// Fills the whole record; counters that the block does not have are 0.
 using CounterParser = void (*)(CounterBlock block, TelemetryCounters& record);
 
 void parseOnlyAlgoGenericCounters(CounterBlock block, TelemetryCounters& record);
@@ -44,10 +44,10 @@ struct ManufacturerId {
 };
 
 /// Of a controller's "manufacturer-id", up to 12 hexadecimal digits: 4 of the vendor, the rest of
-/// the device. Missing ones count as 0; other characters are told on standard output.
+/// the device. Missing digits count as 0; other characters are reported on standard output.
 ManufacturerId readManufacturerId(StandardStreams& streams, std::string_view text);
 
-/// Generations decide before makers.
+/// The generation takes precedence over the maker.
 CounterParser selectCounterParser(std::uint32_t generation, std::uint32_t vendor,
                                   std::uint32_t device);
 

@@ -16,8 +16,8 @@
 
 namespace tavrel {
 
-/// Page-aligned and zeroed, so that what a driver leaves out reads as 0. Empty when the allocation
-/// failed or would exceed the limit; a buffer of 0 bytes is not empty.
+/// Page-aligned and zeroed, so that bytes that a driver does not fill read as 0. Empty when the
+/// allocation failed or would exceed the limit; a buffer of 0 bytes is not empty.
 class DeviceBuffer {
  public:
   DeviceBuffer() = default;
@@ -38,7 +38,7 @@ class DeviceBuffer {
   MutableByteSpan bytes() const { return {memory_.get(), size_}; }
 
  private:
-  /// In bytes; no page of a device is larger.
+  /// In bytes; no device has larger pages.
   static constexpr std::align_val_t kAlignment{65536};
 
   struct Free {

@@ -6,8 +6,8 @@
 
 namespace tavrel {
 
-/// Opens the service, has `use(UserClient&)` do its work, and closes. False when the service cannot
-/// be opened, else what `use` answers; failures of opening and closing are told on standard error.
+/// Opens the service, calls `use(UserClient&)`, and closes. False when the service cannot be
+/// opened, otherwise the result of `use`. Prints failures of opening and closing on standard error.
 template <class Use>
 bool withClient(DriverService& service, StandardStreams& streams, Use use) {
   std::unique_ptr<UserClient> client;

@@ -1,5 +1,5 @@
-// Hexadecimal digits as numbers, leniently: a character that is no digit counts as 0 and is told on
-// standard output.
+// Reads hexadecimal digits as numbers, leniently: a character that is not a digit counts as 0 and
+// is reported on standard output.
 #pragma once
 
 #include <cstdint>

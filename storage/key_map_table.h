@@ -1,7 +1,7 @@
-// Under which key of the NAND information each statistic is reported.
+// The key of the NAND information under which each statistic is reported.
 //
-// A row is the name of a statistic, an element of an array by its index behind the name, and the
-// key without its prefix "com.norvane.NANDInfo.". No name occurs twice.
+// A row is the name of a statistic (of an element of an array: the name and its index), and the key
+// without its prefix "com.norvane.NANDInfo.". No name occurs twice.
 #pragma once
 
 #include <array>

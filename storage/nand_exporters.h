@@ -31,8 +31,7 @@ struct NandExporter {
   void (*release)(ASPContext& context) = nullptr;
 };
 
-/// In the order in which they are looked for. The last row ends the table; all its fields are
-/// empty.
+/// In the order of the search. The last row ends the table; all its fields are empty.
 extern const NandExporter nand_exporters[3];
 
 /// The service of the first kind of driver that is present, null when none is. `exporter` then

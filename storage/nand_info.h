@@ -3,8 +3,7 @@
 //   const plist::Dictionary info = CopyNANDInfo(platform);
 //   if (info.contains(kNANDInfoErrorKey)) complain(info.string(kNANDInfoErrorMessageKey));
 //
-// Keys stand in storage/nand_info_keys.h and storage/key_map_table.h. Every call asks the driver
-// anew.
+// storage/nand_info_keys.h and storage/key_map_table.h have the keys. Each call asks the driver.
 #pragma once
 
 #include <cstdint>
@@ -18,19 +17,19 @@ namespace tavrel {
 /// All figures, or the two error keys.
 plist::Dictionary CopyNANDInfo(Platform& platform);
 
-/// Adds the figures, without the versions and the demo mode, to `target`; nothing when they cannot
-/// be had.
+/// Adds the figures, without the versions and the demo mode, to `target`; nothing when they are not
+/// available.
 void DumpNANDInfo(Platform& platform, plist::Dictionary& target);
 
-/// What a parsed buffer says. Without an export version, or with 0: the two error keys, or an empty
-/// handle in log mode, in which the versions and the demo mode are left out.
+/// The figures of a parsed buffer; log mode leaves out the versions and the demo mode. When the
+/// export version is missing or 0: the two error keys, or an empty handle in log mode.
 plist::Dictionary buildNANDInfo(Preferences& preferences, const ASPContext& context, bool logMode);
 
-/// Stores an entry, in the place of one with the same key.
+/// Stores an entry, in place of one with the same key.
 void CopyDictionary(const plist::String& key, const plist::Value& value, plist::Dictionary& target);
 
-/// The low 32 bits of a duration to three significant figures. Halves go up; a number of three
-/// digits, which would not change, comes out one higher.
+/// Rounds the low 32 bits of a duration to three significant figures, halves up. A number of three
+/// digits comes out one higher.
 std::int64_t roundMaximumDuration(std::uint64_t value);
 
 }  // namespace tavrel

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-/// What all of them begin with.
+/// The prefix of all of them.
 inline constexpr std::string_view kNANDInfoKeyPrefix = "com.norvane.NANDInfo.";
 
 // -- Fixed figures, in the order in which they are set ------------------------------------------
@@ -36,7 +36,7 @@ inline constexpr std::string_view kNANDInfoNumPhysicalErasesKey =
 inline constexpr std::string_view kNANDInfoNumNodesFreeKey = "com.norvane.NANDInfo.NodesFree";
 inline constexpr std::string_view kNANDInfoNumNodesTotalKey = "com.norvane.NANDInfo.NodesTotal";
 
-/// Whole weeks since 2000, in spite of its text.
+/// Whole weeks since 2000, in spite of its name.
 inline constexpr std::string_view kNANDInfoFormatWeeksSince2000Key =
     "com.norvane.NANDInfo.formatDaysSince2000";
 

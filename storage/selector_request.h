@@ -5,7 +5,7 @@
 //   const DeviceBuffer buffer = DeviceBuffer::allocate(size);
 //   fetchList(client, *exporter, SelectorRequest::fetch(table).bytes(), buffer.bytes(), length);
 //
-// A driver without selector tables is asked with no request at all.
+// A driver without selector tables gets no request at all.
 #pragma once
 
 #include <array>
@@ -17,13 +17,13 @@
 
 namespace tavrel {
 
-/// What is sent with a size query and with a fetch.
+/// The request that goes with a size query or a fetch.
 class SelectorRequest {
  public:
   /// 0: the selector (32 bits), 4: flags (16 bits), zeros to the end; little-endian.
   static constexpr std::size_t kBytes = 24;
 
-  /// `requestFlag` is passed on to the driver; `subList` tells lists of one selector apart.
+  /// `requestFlag` is passed on to the driver; `subList` distinguishes the lists of one selector.
   static SelectorRequest sizeQuery(const SelectorTable& table, bool requestFlag = false,
                                    std::uint8_t subList = 0) {
     return {table.sizeQuery, kSizeQueryFlag, requestFlag, subList};
@@ -50,12 +50,12 @@ class SelectorRequest {
   std::array<std::byte, kBytes> bytes_{};
 };
 
-/// Asks for the size of a list in bytes. Bytes that the driver does not answer count as 0.
+/// Asks for the size of a list in bytes. Missing bytes of the answer count as 0.
 KernelReturn querySize(UserClient& client, const NandExporter& exporter, ByteSpan request,
                        std::uint32_t& size);
 
-/// Fetches a list. `length` receives how many bytes the driver filled in, never more than there
-/// are.
+/// Fetches a list. `length` receives how many bytes the driver filled in, at most the size of the
+/// buffer.
 KernelReturn fetchList(UserClient& client, const NandExporter& exporter, ByteSpan request,
                        MutableByteSpan buffer, std::size_t& length);
 

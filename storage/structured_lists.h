@@ -1,8 +1,8 @@
-// What is logged of the lists that the storage driver answers with. All fields are little-endian.
+// Logs the lists of the storage driver. All their fields are little-endian.
 //
-// A callback takes a list's buffer and the controller's characteristics, and answers whether the
-// list could be logged. Diagnostics go to standard error. Texts can always be read and small
-// dictionaries made, so that nothing is said of those.
+// A callback takes a list's buffer and the controller's characteristics, and returns whether the
+// list could be logged. Diagnostics go to standard error. Reading texts and making small
+// dictionaries cannot fail, so there are no diagnostics for them.
 #pragma once
 
 #include "base/bytes.h"
@@ -21,8 +21,8 @@ bool logValidityList(Platform& platform, ByteSpan buffer, const plist::Value& ch
 /// Files one structured record for each flash channel.
 bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
 
-/// Files the factory's count of bad blocks and one structured record for each defect that grew
-/// since, as far as they lie in the buffer.
+/// Files the factory's count of bad blocks and one structured record for each defect that has grown
+/// since, as far as the buffer holds them.
 bool logDefectsList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
 
 }  // namespace tavrel

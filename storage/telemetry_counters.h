@@ -1,4 +1,4 @@
-// The counters of a NAND chip, in the common form that all makers' blocks are brought into.
+// The counters of a NAND chip, in a form common to the blocks of all makers.
 //
 //   for (const CounterArrayShape& shape : kCounterArrays)
 //     for (const std::uint32_t counter : counters[shape.array]) ...
@@ -30,7 +30,7 @@ struct CounterArrayShape {
   CounterArray array;
   std::string_view name;
   std::size_t size;       // in elements
-  std::size_t first = 0;  // element of the record that it begins with
+  std::size_t first = 0;  // element of the record with which it begins
 };
 
 /// The arrays in their order.
@@ -61,7 +61,7 @@ constexpr const CounterArrayShape& shapeOf(CounterArray array) {
   return kCounterArrays[static_cast<std::size_t>(array)];
 }
 
-/// All arrays, one behind the other.
+/// All arrays, one after another.
 struct TelemetryCounters {
   std::array<std::uint32_t, kCounterArrays.back().first + kCounterArrays.back().size> elements{};
 

@@ -1,5 +1,5 @@
-// Flash writes of the virtual-memory freezer: those of its kernel thread, found by name in a stack
-// snapshot.
+// Flash writes of the virtual-memory freezer: the writes of its kernel thread, found by name in a
+// stack snapshot.
 //
 //   const plist::Dictionary info = CopyVMFreezerNANDInfo(platform.stackSnapshots);
 //
@@ -21,27 +21,27 @@
 
 namespace tavrel {
 
-/// Takes a snapshot and yields a dictionary of the caller's: the freezer's writes under
-/// kNANDInfoVMFreezerNumPhysicalWritesKey, 0 when its thread has no IO statistics; or the two error
-/// keys when no snapshot can be had, the thread is not in it, or its IO statistics end before the
-/// counter.
+/// Takes a snapshot. Yields a dictionary of the caller's own with the freezer's writes under
+/// kNANDInfoVMFreezerNumPhysicalWritesKey, 0 when its thread has no IO statistics. Yields the two
+/// error keys when there is no snapshot, the thread is not in it, or its IO statistics end before
+/// the counter.
 plist::Dictionary CopyVMFreezerNANDInfo(StackSnapshots& snapshots);
 
-/// Looks through the first container of `items`, and all that it contains, for a container that
-/// holds a thread name equal to `threadName`; the innermost ends first and wins. A name item
-/// counts for as many bytes as it has, 64 at most, and up to a zero byte.
+/// Searches the first container of `items`, and everything in it, for a container that holds a
+/// thread name equal to `threadName`; the innermost ends first and wins. Of a name item, at most 64
+/// bytes count, up to a zero byte.
 ///
-/// When there is one, answers true and sets `ioStatistics` to the payload of its last IO statistics
-/// item, to nothing when it has none. Else answers false and leaves `ioStatistics` as it was; so it
-/// does when there is no name to look for. Takes time in proportion to `items` and memory in
-/// proportion to the depth of nesting, less than twice the size of `items`.
+/// When there is one, returns true and sets `ioStatistics` to the payload of its last IO statistics
+/// item, or to nothing when it has none. Otherwise, and when there is no name to search for,
+/// returns false and leaves `ioStatistics` unchanged. Takes time in proportion to `items` and
+/// memory in proportion to the depth of nesting, less than twice the size of `items`.
 bool getIOStatsWithThreadnameFromKCData(ByteSpan items, std::optional<std::string_view> threadName,
                                         std::optional<ByteSpan>& ioStatistics);
 
 /// The same; `position`, when given, is set to the part of `items` that begins with the item that
-/// ended the scan: the end of the container that was found, else the end of the first one, or what
-/// stands in place of an end (an end of the buffer, an item that is not wholly there). It is left
-/// as it was when there is no container.
+/// ended the scan: the end of the container that was found, otherwise the end of the first one, or
+/// whatever took the place of an end (the end of the buffer, a truncated item). It stays unchanged
+/// when there is no container.
 bool getIOStatsWithThreadnameFromKCDataHelper(ByteSpan items,
                                               std::optional<std::string_view> threadName,
                                               std::optional<ByteSpan>& ioStatistics,

@@ -1,4 +1,5 @@
-// What a statistics buffer says: a few fixed fields, and every recognised statistic by its name.
+// The content of a statistics buffer: a few fixed fields, and each recognised statistic by its
+// name.
 //
 //   ASPContext context;
 //   if (ASPParseBufferToCxt(context, buffer) != 0) {
@@ -6,7 +7,7 @@
 //   }
 //   ASPReleaseContext(context);
 //
-// A context begins empty, with all fields zero. It owns its entries, which stay where they are
+// A context begins empty, with all fields zero. It owns its entries, which keep their addresses
 // until it is released or goes out of scope.
 #pragma once
 
@@ -51,7 +52,7 @@ struct ASPContext {
   ASPList<ASPNameEntry> names;
   ASPList<ASPValueEntry> values;
 
-  /// Where the entries of the lists lie.
+  /// Holds the entries of the lists.
   ASPEntryArena arena;
 };
 

@@ -1,4 +1,4 @@
-// The entries of a statistics context and where they lie.
+// The entries of a statistics context, and the blocks that hold them.
 #pragma once
 
 #include <array>
@@ -8,7 +8,7 @@
 
 namespace tavrel {
 
-/// A text of at most 98 characters, terminated; what lies behind its end is undefined.
+/// A terminated text of at most 98 characters; bytes after its end are undefined.
 using ASPText = std::array<char, 100>;
 inline constexpr std::size_t kLongestASPText = 98;
 

@@ -12,15 +12,15 @@
 
 namespace tavrel {
 
-/// Adds what the buffer says to the context. 1 when every record was consumed, else 0: the buffer
-/// is shorter than a unit, a record is bad (the export version is then 0), or memory is short. What
-/// was recorded before a failure stays. Bytes behind the last whole unit are passed over.
+/// Adds the content of the buffer to the context. 1 when all records were consumed, otherwise 0:
+/// the buffer is shorter than a unit, a record is bad (the export version is then 0), or memory is
+/// short. Records before the failure stay. Bytes after the last whole unit are skipped.
 int ASPParseBufferToCxt(ASPContext& context, ByteSpan buffer);
 
-/// Frees the entries and makes the whole context zero.
+/// Frees the entries and zeroes the whole context.
 void ASPReleaseContext(ASPContext& context);
 
-/// Steps of the parser. They answer false when an entry cannot be allocated.
+/// Steps of the parser. They return false when an entry cannot be allocated.
 
 /// Stores and lists all values of one record, already limited to the statistic's cap.
 bool ASPRecordValues(ASPContext& context, std::uint32_t key, std::string_view name,

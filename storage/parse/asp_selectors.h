@@ -22,7 +22,7 @@ inline constexpr SelectorTable snapshotSelectors{22, 22};
 inline constexpr SelectorTable snapshotHeaderSelectors{145, 145};
 
 /// The tables are constant for the life of the process. A getter of another kind of driver may
-/// answer null: that driver has no such list.
+/// return null: that driver has no such list.
 using SelectorGetter = const SelectorTable* (*)();
 
 const SelectorTable* ASPGetStatsSelectors();

@@ -25,13 +25,13 @@ inline constexpr std::string_view kNandLogLastLoggedKey = "SSLastLoggedAt";
 inline constexpr double kNandLogPeriod = 604800;
 
 /// Writes the log unless the last one is younger than the period or is dated later than now. An
-/// empty handle for `statistics` writes nothing. The moment of the log is stored whether or not the
-/// submission service took it. A `PlatformException` of a service is logged and ends the call;
-/// every other exception passes on.
+/// empty handle for `statistics` writes nothing. The date of the log is stored whether or not the
+/// submission service accepted it. A `PlatformException` of a service is logged and ends the call;
+/// other exceptions pass through.
 void NLW_WriteLog(Platform& platform, std::string_view logType,
                   const plist::Dictionary& statistics);
 
-/// The device's inverse identifier, "error" when the device does not tell it.
+/// The device's inverse identifier, "error" when the device does not answer.
 std::string GetFaultlineKey(DeviceAnswers& deviceAnswers);
 
 }  // namespace tavrel

@@ -1,5 +1,5 @@
-// The descriptor that a storage controller supplies with snapshot records of any size: which
-// records there are, and place, kind and format of each of their fields.
+// The descriptor that a storage controller supplies with snapshot records of any size: the number
+// of records, and the place, kind and format of each field.
 //
 // Little-endian, offsets in bytes from its start:
 //
@@ -11,9 +11,8 @@
 //                                                      8  bytes of latencies (kind 3)
 //                                                     12  format, 16 bytes, to its zero byte
 //
-// Kinds 0 and 1 are numbers, 2 microseconds, 3 latencies. Fields of further kinds print nothing,
-// and nothing of them is looked at but the offset of a first field: firmware to come may put
-// anything there.
+// Kinds 0 and 1 are numbers, 2 microseconds, 3 latencies. Fields of other kinds print nothing and
+// are ignored, except for the offset of a first field: future firmware may put anything there.
 #pragma once
 
 #include <cstddef>
@@ -37,12 +36,12 @@ struct SnapshotDescriptor {
   std::vector<SnapshotField> fields;    // that print something
 };
 
-/// Checks a descriptor against itself and against the size of its records' buffer: whatever is read
-/// of any record must lie in the buffer. Records may overlap, and the last may be cut behind what
-/// is read of it. Refused, with the reason, is what leaves the buffer or the descriptor, a text
-/// without its zero byte, a table without fields when there are records (the first field tells
-/// which are used), and a format that asks for other arguments than its kind gives: numbers for
-/// kinds 0 to 2, a text for kind 3, no widths. A format may take fewer arguments than there are.
+/// Checks a descriptor against itself and against the size of its records' buffer: all reads of all
+/// records must lie in the buffer. Records may overlap, and the last may be cut after its last
+/// read. Refuses, with the reason, a descriptor that leads outside the buffer or itself, a text
+/// without its zero byte, a table without fields when there are records (the first field says which
+/// are used), and a format that needs arguments other than its kind gives: numbers for kinds 0 to
+/// 2, a text for kind 3, no widths. A format may take fewer arguments than there are.
 Expected<SnapshotDescriptor> readSnapshotDescriptor(ByteSpan descriptor, std::size_t recordBytes);
 
 }  // namespace tavrel

@@ -14,14 +14,14 @@ namespace tavrel {
 
 class SnapshotWriter {
  public:
-  /// The buffer is borrowed; its last byte is for the zero byte behind the text.
+  /// The buffer is borrowed; its last byte is for the zero byte after the text.
   explicit SnapshotWriter(std::span<char> buffer) : rest_(buffer), capacity_(buffer.size()) {}
 
-  /// Adds a piece. False when there is no room for all of it with a zero byte behind; the buffer
-  /// then ends with as much of it as there is room for.
+  /// Adds a piece. False when there is no room for all of it and a zero byte; the buffer then ends
+  /// with as much of it as fits.
   bool write(std::string_view piece);
 
-  /// Adds the fields of one record and a line end. Every field must lie in the record.
+  /// Adds the fields of one record and a line end. All fields must lie in the record.
   bool writeLine(std::span<const SnapshotField> fields, ByteSpan record);
 
   std::size_t length() const { return capacity_ - rest_.size(); }

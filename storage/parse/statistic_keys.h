@@ -1,8 +1,7 @@
 // The statistics that the storage controller is known to report.
 //
-// A row is the number of a statistic, its name, and, for those that carry several values, the
-// largest number of values that is taken from a record. Numbers that are not listed belong to
-// statistics that are passed over. The rows ascend.
+// A row is the number of a statistic, its name, and, for a statistic with several values, the most
+// values taken from a record. Statistics with other numbers are skipped. The rows ascend.
 #pragma once
 
 #include <array>
