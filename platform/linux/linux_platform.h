@@ -3,10 +3,10 @@
 //   LinuxPlatform linux(DeviceRoot::fromEnvironment());
 //   runDailyIfNeeded(linux.platform(), {});
 //
-// Variants of a platform copy the bundle and replace what they do differently in the copy.
+// Variants of a platform copy the bundle and replace the services that differ.
 //
-// It owns the services. Nothing is opened or read before it is asked for. On destruction the values
-// that the store holds back are committed, then preferences that were changed are written.
+// It owns the services. It opens and reads nothing before the first use. Destruction commits the
+// values that the store holds back, then writes changed preferences.
 #pragma once
 
 #include <memory>
@@ -23,7 +23,7 @@ class FileSystem;
 class RecordedRegistry;
 class SqliteStore;
 
-/// What one Linux platform may differ in from another. What is given here must outlive it.
+/// How one Linux platform may differ from another. Everything given here must outlive it.
 struct LinuxPlatformOptions {
   SystemLog* log = nullptr;            // in place of the journal or standard error
   FileSystem* fileSystem = nullptr;    // what writes files, in place of its own

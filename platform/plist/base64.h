@@ -12,7 +12,7 @@ namespace tavrel::plist {
 void appendBase64(std::string& out, ByteSpan bytes);
 
 /// Reads base64 with white space anywhere in it into `out`, whose content is replaced. False for
-/// any other character, and for a text that does not end as its padding says.
+/// any other character, and for a text whose end does not fit its padding.
 bool readBase64(std::string_view text, std::vector<std::byte>& out);
 
 }  // namespace tavrel::plist

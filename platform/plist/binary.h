@@ -7,9 +7,9 @@
 //   const auto document = plist::readBinary(bytes);
 //   if (!document) log(document.error().message);  // "binary property list, offset 8: ..."
 //
-// What is written reads back equal, but for malformed UTF-8, each byte of which becomes U+FFFD
-// (keys that become equal by that are told apart as in platform/plist/xml.h). Floats and doubles
-// keep their kind, integers are read as 64-bit ones.
+// What is written reads back equal, except for malformed UTF-8: each such byte becomes U+FFFD (keys
+// that become equal are distinguished as in platform/plist/xml.h). Floats and doubles keep their
+// kind, integers are read as 64-bit ones.
 #pragma once
 
 #include <string>
@@ -20,8 +20,8 @@
 
 namespace tavrel::plist {
 
-/// Keys are in the order of their bytes. Fails for a value that is or contains null, and for what
-/// the limits of base/limits.h would not let back in.
+/// Keys are in the order of their bytes. Fails for a value that is or contains null, and for a
+/// document that the limits of base/limits.h would refuse to read.
 Expected<std::string> writeBinary(const Value& value);
 
 /// The value is the caller's own: a container or data that the document refers to from several

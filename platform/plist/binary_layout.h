@@ -1,4 +1,4 @@
-// The layout of the binary encoding, as reader and writer share it.
+// The layout of the binary encoding, shared by reader and writer.
 //
 //   header   "bplist00"
 //   objects  each a marker byte, whose high four bits are the type, and its content
@@ -37,7 +37,7 @@ inline constexpr std::uint8_t kTypeMask = 0xF0;
 inline constexpr std::uint8_t kLengthMask = 0x0F;
 inline constexpr std::uint8_t kLengthFollows = 0x0F;
 
-// Offsets in the trailer; the first six bytes are of no use here.
+// Offsets in the trailer; the first six bytes are not used here.
 inline constexpr std::size_t kOffsetWidthAt = 6;
 inline constexpr std::size_t kReferenceWidthAt = 7;
 inline constexpr std::size_t kObjectCountAt = 8;

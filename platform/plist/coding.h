@@ -1,4 +1,4 @@
-// Property-list coding as the platform offers it, and reading of either encoding.
+// Property-list coding as a service of the platform, and reading of either encoding.
 #pragma once
 
 #include <string>
@@ -13,7 +13,7 @@ namespace tavrel::plist {
 /// Reads an XML or a binary document, recognised by content.
 Expected<Value> read(ByteSpan bytes);
 
-/// Without state of its own: one may serve all.
+/// Stateless: one object can serve all.
 class PlistCoding final : public PropertyListCoding {
  public:
   Expected<std::string> encodeXml(const Value& value) override;

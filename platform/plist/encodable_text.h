@@ -1,4 +1,4 @@
-// Text as an encoding, or the message of an error, can hold it.
+// Text in the form that an encoding, or an error message, can hold.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@ enum class Alphabet : std::uint8_t {
   Xml       // without the control characters and U+FFFE, U+FFFF that XML 1.0 forbids
 };
 
-/// True when the alphabet has all of the text.
+/// True when the alphabet has all characters of the text.
 bool isEncodable(std::string_view text, Alphabet alphabet);
 
 /// The text with U+FFFD for each malformed byte and each character that the alphabet lacks.
@@ -22,8 +22,8 @@ std::string encodable(std::string_view text, Alphabet alphabet);
 /// return is escaped too: parsers turn a plain one into a line feed.
 void appendXmlText(std::string& out, std::string_view text);
 
-/// The start of a text for a message: on one line, escaped as JSON does, and cut with "..." behind
-/// 60 bytes.
+/// The start of a text for a message: on one line, escaped as JSON does, and cut after 60 bytes
+/// with "...".
 std::string excerpt(std::string_view text);
 
 }  // namespace tavrel::plist

@@ -1,4 +1,4 @@
-// What the two encoders share: which values are refused, and the order of keys.
+// Shared by the two encoders: refused values, and the order of keys.
 #pragma once
 
 #include <cstddef>
@@ -13,8 +13,8 @@
 
 namespace tavrel::plist {
 
-/// Admits the values of one document and remembers why it did not. Operations answer false for a
-/// failure, so that a walk can return what they answer.
+/// Admits the values of one document, and remembers the reason for a refusal. Operations return
+/// false for a failure, so that a walk can pass their result on.
 class EncodingGuard {
  public:
   explicit EncodingGuard(std::size_t largestCount) : largestCount_(largestCount) {}
@@ -40,8 +40,8 @@ class EncodingGuard {
   bool hasPath_ = false;
 };
 
-/// The entries of dictionaries in the order of their keys, as the alphabet holds them. It works as
-/// a stack, since dictionaries nest: entries stay until they are popped. Entries borrow from the
+/// The entries of dictionaries in the order of their keys, with the keys in the alphabet. It is a
+/// stack, because dictionaries nest: entries stay until they are popped. Entries borrow from the
 /// dictionary.
 class SortedEntries {
  public:
@@ -64,7 +64,7 @@ class SortedEntries {
 
   Alphabet alphabet_;
   std::vector<Item> items_;
-  std::deque<std::string> repaired_;  // keys that stand in no dictionary
+  std::deque<std::string> repaired_;  // keys that no dictionary holds
 };
 
 }  // namespace tavrel::plist

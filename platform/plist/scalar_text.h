@@ -12,16 +12,16 @@ namespace tavrel::plist {
 /// Integers in decimal; reals in the shortest text that reads back to the same double.
 void appendNumber(std::string& out, const Number& number);
 
-/// Decimal or, behind "0x", hexadecimal digits with an optional sign, from the least signed to the
-/// largest unsigned 64-bit integer; nothing for any other text.
+/// Decimal digits or, after "0x", hexadecimal ones, with an optional sign, from the least signed to
+/// the largest unsigned 64-bit integer; nothing for any other text.
 std::optional<Number> parseInteger(std::string_view text);
 
 /// A decimal number, "nan", "inf" or "infinity" in either case, with an optional sign; nothing for
-/// any other text, and for a number beyond the range of a double.
+/// any other text and for a number beyond the range of a double.
 std::optional<double> parseReal(std::string_view text);
 
-/// Appends "2026-11-16T18:02:18Z", rounded down to the second. False, and nothing appended, for a
-/// date that no calendar reaches.
+/// Appends "2026-11-16T18:02:18Z", rounded down to the second. For a date beyond the calendar,
+/// appends nothing and returns false.
 bool appendDate(std::string& out, Date date);
 
 /// Reads the form that `appendDate` writes.

@@ -1,14 +1,14 @@
 // The XML encoding of property lists.
 //
-// Written: UTF-8, no document-type line, tabs, keys in the order of their bytes, so that equal
-// values give equal bytes (numbers are equal here when they are of the same sort and value). Read:
-// every encoding that Expat knows, with or without a document-type line; no entity is declared or
-// expanded, and nothing is fetched.
+// The writer produces UTF-8 without a document-type line, with tabs, and with keys in the order of
+// their bytes, so that equal values give equal bytes (numbers are equal here when they are of the
+// same sort and value). The reader takes any encoding that Expat knows, with or without a
+// document-type line; it declares and expands no entity and fetches nothing.
 //
 //   const auto document = plist::readXml(bytes);
 //   if (!document) log(document.error().message);  // "XML property list, line 3, column 7: ..."
 //
-// What is written reads back equal, but for what XML cannot hold:
+// What is written reads back equal, except for what XML cannot hold:
 //   - control characters (other than tab, line feed and carriage return), U+FFFE, U+FFFF and
 //     malformed UTF-8 become U+FFFD. Keys that become equal by that are told apart by a number
 //     behind the later ones: "a\x01", "a\x02" are written as "a\uFFFD", "a\uFFFD2";
@@ -24,13 +24,13 @@
 
 namespace tavrel::plist {
 
-/// Fails for a value that is or contains null, a date that no calendar reaches (not a number, or
-/// more than 10^9 years off), and for what nests too deeply or is too long to be read back. More
-/// values than `readXml` takes are no failure: a large log is better written than lost.
+/// Fails for a value that is or contains null, a date beyond the calendar (not a number, or more
+/// than 10^9 years off), and for a document that nests too deeply or is too long to be read back.
+/// More values than `readXml` takes do not make it fail: a large log is better written than lost.
 Expected<std::string> writeXml(const Value& value);
 
-/// The value is the caller's own. Want of memory is no error of the document, which may be whole:
-/// it throws std::bad_alloc. Of two equal keys in one dictionary the later wins.
+/// The value is the caller's own. Short memory is not an error of the document, so it throws
+/// std::bad_alloc. Of two equal keys in one dictionary the later wins.
 Expected<Value> readXml(ByteSpan bytes);
 
 }  // namespace tavrel::plist

@@ -1,18 +1,18 @@
-// The applications that offer themselves in menus, from their desktop entries.
+// The applications that appear in menus, from their desktop entries.
 //
 // Entries are files *.desktop below the "applications" folder of each data folder. One counts when
 // it has "Type=Application" and neither "NoDisplay=true" nor "Hidden=true". The file's path below
-// that folder, with "-" for "/", names the application; the first data folder that has an entry of
-// a name decides about it, in this order:
+// that folder, with "-" for "/", names the application. The first data folder with an entry of a
+// name decides, in this order:
 //
 //   /home/*/.local/share, /root/.local/share    the users' own
 //   /var/lib/flatpak/exports/share, /usr/local/share
 //   /usr/share                                  the system's
 //
-// A folder of a user that is a symbolic link is passed over, and so is an entry larger than
+// A user's folder that is a symbolic link is skipped, and so is an entry larger than
 // `limits::kDesktopEntryBytes`. The walk ends after `limits::kDesktopFiles` files and folders.
 //
-// Applications of all but the last count as installed by the user.
+// Applications of all folders except the last count as installed by the user.
 #pragma once
 
 #include <functional>

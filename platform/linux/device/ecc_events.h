@@ -3,14 +3,14 @@
 //
 // "NAME.event" holds one event of 72 bytes: the event's identifier and its count of registers (a
 // byte each), 6 bytes that are not read, and 8 registers of 64 bits in little-endian order.
-// "NAME.errno" holds the decimal number of an error with which one read fails. They are taken in
-// the order of their names, and each read removes one. Files of other names are left alone.
+// "NAME.errno" holds the decimal number of an error with which one read fails. Each read takes the
+// first file in the order of names and removes it. Files with other names are ignored.
 //
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
 // identifier 1 for corrected and 2 for uncorrected errors, with the number of the memory
-// controller, the new errors and all errors since the machine started as registers. What was seen
-// is remembered in /var/lib/tavrel/edac-counters.plist, with the boot in which it was: in another
-// boot the kernel counts from 0.
+// controller, the new errors and all errors since the machine started as registers.
+// /var/lib/tavrel/edac-counters.plist remembers the counts and the boot in which they were seen,
+// because in another boot the kernel counts from 0.
 #pragma once
 
 #include <cstddef>
@@ -32,34 +32,34 @@ inline constexpr std::size_t kEccEventBytes = 72;
 
 class EccEvents {
  public:
-  /// `Peek` shows the same events without removing or publishing any.
+  /// `Peek` yields the same events without removing or publishing any.
   enum class Mode { Consume, Peek };
 
   EccEvents(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
             SystemLog& log, Mode mode)
       : root_(root), files_(files), propertyLists_(propertyLists), log_(log), mode_(mode) {}
 
-  /// Takes the next event. ENOENT when there is none, ENOMEM when it does not fit; `buffer` is
-  /// then left alone.
+  /// Takes the next event. ENOENT when there is none, ENOMEM when it does not fit; `buffer` then
+  /// stays unchanged.
   SystemControls::Result next(MutableByteSpan buffer);
 
  private:
   struct Event {
     std::string name;   // of its file
-    std::string bytes;  // empty: they are in the file
+    std::string bytes;  // empty when they are in the file
   };
 
   void fill();
   /// Moves an unusable file out of the way, or says that it would.
   void setAside(const std::string& path, std::string_view fault);
-  /// What had been counted at the last look; of a controller that is gone, the last that was told.
+  /// The counts at the last look; for a controller that is gone, the last known ones.
   plist::Dictionary seenErrors();
-  /// Writes events for what was counted since the last look, and remembers it.
+  /// Writes events for the errors counted since the last look, and remembers the counts.
   void publishCountedErrors();
-  /// The events for what was counted beyond `counted`, which is brought up to date.
+  /// The events for errors beyond `counted`, which is updated.
   std::vector<Event> newErrors(plist::Dictionary& counted);
-  /// The id of the boot in which the controllers of that folder count: a root that has controllers
-  /// of its own has the machine's boots as little as its errors. Empty when it is not told.
+  /// The id of the boot in which the controllers of that folder count. A root that has controllers
+  /// of its own shares neither the machine's errors nor its boots. Empty when unknown.
   std::string bootIDBeside(const std::string& controllers);
 
   const DeviceRoot& root_;

@@ -1,6 +1,6 @@
 // The device-answers query, answered from /etc/tavrel/device-answers.plist: a dictionary from
-// question to answer. Without an entry "DiskUsage" is answered from the file system that holds, or
-// would hold, the data folder /var/mobile.
+// question to answer. Without an entry "DiskUsage", the answer comes from the file system that
+// holds, or would hold, the data folder /var/mobile.
 #pragma once
 
 #include <optional>

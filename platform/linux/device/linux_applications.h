@@ -1,7 +1,7 @@
 // The installed applications of a Linux device.
 //
-// Kind 1, all installed applications, is the list of the package manager (package_database.h), or,
-// where that has none, of the desktop entries (desktop_entries.h). Other kinds have no bundles.
+// Kind 1, all installed applications, is the list of the package manager (package_database.h) or,
+// when that is empty, of the desktop entries (desktop_entries.h). Other kinds have no bundles.
 #pragma once
 
 #include "platform/application_registry.h"

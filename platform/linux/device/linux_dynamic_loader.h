@@ -1,15 +1,15 @@
-// The libraries that the program may load while it runs.
+// The libraries that the program may load at run time.
 //
-// The platform offers them itself: a table answers each path with functions bound to its services.
-// Whatever is not in the table does not load.
+// The platform itself provides them: a table maps each path to functions bound to its services.
+// Other libraries do not load.
 //
 //   /System/Library/PrivateFrameworks/FaultlineSupport.framework/FaultlineSupport
 //     ZTXPreferencesGetIntegerValue   IntegerPreferenceGetter
 //     ZTXPreferencesSetValue          PreferenceSetter
 //
-// /etc/tavrel/dynamic-libraries.plist under the device root takes from it, so that what depends on
-// a library can be seen without it: under the path of a library, false when it does not load, or
-// an array of names of functions that it lacks. The file is read at each load.
+// /etc/tavrel/dynamic-libraries.plist under the device root can take libraries away, to show the
+// behaviour without them: under the path of a library, false when it does not load, or an array of
+// the functions that it lacks. The file is read at each load.
 #pragma once
 
 #include "platform/dynamic_loading.h"
@@ -23,7 +23,7 @@ namespace tavrel {
 
 class LinuxDynamicLoader final : public DynamicLoader {
  public:
-  /// Functions that were found use `preferences` for as long as they live.
+  /// Functions use `preferences`, which must outlive them.
   LinuxDynamicLoader(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
                      SystemLog& log, Preferences& preferences)
       : root_(root),

@@ -1,10 +1,9 @@
 // System controls on Linux.
 //
-// What /etc/tavrel/system-controls.plist under the device root tells about a name comes first, read
-// once: bytes as they are, an integer in little-endian order over the whole buffer, or a failure as
-// {"errno": NUMBER}. "vm.swapusage" is otherwise answered from the kernel, and
-// "kern.next_ecc_event" from the queue of platform/linux/device/ecc_events.h. Other names do not
-// exist (ENOENT).
+// Entries of /etc/tavrel/system-controls.plist under the device root, read once, take precedence:
+// bytes, an integer in little-endian order over the whole buffer, or a failure as {"errno":
+// NUMBER}. Otherwise "vm.swapusage" comes from the kernel, and "kern.next_ecc_event" from the queue
+// of platform/linux/device/ecc_events.h. Other names do not exist (ENOENT).
 #pragma once
 
 #include <array>

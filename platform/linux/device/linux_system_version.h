@@ -1,5 +1,5 @@
-// What system the device runs: /etc/tavrel/system-version.plist or, where there is no such file,
-// made from os-release.
+// The system that the device runs, from /etc/tavrel/system-version.plist or, without that file,
+// from os-release.
 #pragma once
 
 #include <optional>
@@ -21,7 +21,7 @@ class LinuxSystemVersion final : public SystemVersion {
 
   plist::Dictionary systemVersionDictionary() override;
 
-  /// "name version (build)"; what is not known is left out, "unknown" when nothing is.
+  /// "name version (build)" without unknown parts; "unknown" when all are.
   std::string text();
 
  private:
@@ -35,7 +35,7 @@ class LinuxSystemVersion final : public SystemVersion {
   plist::Dictionary known_;
 };
 
-/// The value of `name` in the text of an os-release file, quotes and escapes resolved; a later
+/// The value of `name` in the text of an os-release file, with quotes and escapes resolved; a later
 /// assignment wins.
 std::optional<std::string> osReleaseValue(std::string_view text, std::string_view name);
 

@@ -1,4 +1,4 @@
-// A file descriptor that is closed when its owner goes.
+// A file descriptor that its owner closes.
 #pragma once
 
 #include <unistd.h>
@@ -9,7 +9,7 @@ namespace tavrel {
 class Descriptor {
  public:
   Descriptor() = default;
-  /// Owns `descriptor`; a negative one, as a failed call gives it, is none.
+  /// Owns `descriptor`; a negative one, as from a failed call, means none.
   explicit Descriptor(int descriptor) : descriptor_(descriptor) {}
   Descriptor(Descriptor&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}
   Descriptor& operator=(Descriptor&& other) noexcept {
@@ -22,7 +22,7 @@ class Descriptor {
   explicit operator bool() const { return descriptor_ >= 0; }
   int release() { return std::exchange(descriptor_, -1); }
   void reset() {
-    // The number is free whatever close answers.
+    // The number is free whatever close returns.
     if (descriptor_ >= 0) close(std::exchange(descriptor_, -1));
   }
 

@@ -1,7 +1,7 @@
 // The folder that holds the device's files.
 //
-// Every path of the device lies below it: "/" on a device, another folder in tests and where one
-// machine carries several devices.
+// All paths of the device lie below it: "/" on a device, another folder in tests or when one
+// machine hosts several devices.
 //
 //   const DeviceRoot root = DeviceRoot::fromEnvironment();
 //   root.path("/etc/tavrel/device-answers.plist");
@@ -16,14 +16,14 @@ class DeviceRoot {
  public:
   explicit DeviceRoot(std::string root);
 
-  /// The folder that TAVREL_ROOT names, else "/".
+  /// The folder that TAVREL_ROOT names, otherwise "/".
   static DeviceRoot fromEnvironment();
 
   /// The path on this machine of a path on the device.
   std::string path(std::string_view devicePath) const;
 
-  /// The same for what the kernel or the machine answers when the root does not hold it: the path
-  /// below the root when something is there, else `devicePath` itself.
+  /// The same for files of the kernel or the machine that the root may lack: the path below the
+  /// root when it exists, otherwise `devicePath` itself.
   std::string pathOrMachine(std::string_view devicePath) const;
 
  private:

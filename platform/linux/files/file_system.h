@@ -1,20 +1,20 @@
-// Durable files. Whatever the platform writes goes through here, so that a reader never sees half
-// a file and a power cut leaves either the old content or the new.
+// Durable files. The platform writes everything through this layer, so that a reader never sees
+// half a file and a power cut leaves either the old content or the new.
 //
-// A file is replaced by writing a temporary file beside it, flushing that, renaming it over the
-// file and flushing the folder:
+// To replace a file, it writes and flushes a temporary file in the same folder, renames it over the
+// file and flushes the folder:
 //
 //   if (Status done = files.replace(path, bytes, 0644); !done) log.write(...,
 //   done.error().message);
 //
-// or piece by piece, where a file that is not committed vanishes with its handle:
+// or piece by piece; a file that is not committed vanishes with its handle:
 //
 //   Expected<NewFile> file = files.create(path, 0640);
 //   file->write(bytes);
 //   file->commit();
 //
-// Every error names the path and carries the system's own words. The calls to the system are
-// virtual: tests derive one that loses what was not flushed and one whose n-th call fails.
+// All errors name the path and have the system's own words. The system calls are virtual: tests
+// derive a file system that loses unflushed data and one whose n-th call fails.
 #pragma once
 
 #include <cstddef>
@@ -36,7 +36,7 @@ namespace tavrel {
 
 class FileSystem;
 
-/// A file that does not exist under its name yet. Without `commit` nothing is left of it.
+/// A file that does not have its name yet. Without `commit` it vanishes.
 class NewFile {
  public:
   NewFile(NewFile&& other) noexcept;
@@ -45,10 +45,10 @@ class NewFile {
 
   /// Appends all of `bytes`.
   Status write(ByteSpan bytes);
-  /// Writes the content through to storage, still without its name.
+  /// Flushes the content to storage; the file still lacks its name.
   Status flush();
-  /// Flushes, then gives the file its name in the place of an earlier one and makes that durable.
-  /// When only the last step fails the file is in place, but may not survive a power cut.
+  /// Flushes, gives the file its name in place of an earlier file, and makes that durable. When
+  /// only the last step fails, the file is in place but may not survive a power cut.
   Status commit();
 
  private:
@@ -62,15 +62,15 @@ class NewFile {
   bool flushed_ = false;
 };
 
-/// A file that grows by whole entries. It is locked until the handle is released, so that whoever
-/// appends in the same way waits; reading goes on.
+/// A file that grows by whole entries. Its lock is held until the handle is released; other
+/// appenders wait, readers do not.
 class AppendedFile {
  public:
-  /// Appends `bytes` in one write, which survives the end of the process but not of the power. When
-  /// they do not fit, nothing of them is left. A last line that a power cut left without its end
-  /// gets one first. Nothing is appended beyond `largest` bytes.
+  /// Appends `bytes` with one write, which survives the end of the process but not a power cut.
+  /// When they do not fit, none of them stays. A last line that a power cut left unfinished first
+  /// gets its end. The file does not grow beyond `largest` bytes.
   Status append(ByteSpan bytes, std::size_t largest);
-  /// Writes the file and its name through to storage.
+  /// Flushes the file and its name to storage.
   Status flush();
 
  private:
@@ -85,7 +85,7 @@ class AppendedFile {
   std::string path_;
   Descriptor descriptor_;
   std::uint64_t size_;
-  bool isLineEnded_ = false;  // known to be; else to be looked at
+  bool isLineEnded_ = false;  // true when known; otherwise it must be checked
 };
 
 class FileSystem {
@@ -95,37 +95,37 @@ class FileSystem {
   FileSystem(const FileSystem&) = delete;
   FileSystem& operator=(const FileSystem&) = delete;
 
-  /// The whole content of a regular file; anything else in its place is refused unread. Larger
-  /// than `largest` bytes is an error.
+  /// The whole content of a regular file. Anything else is refused unread; more than `largest`
+  /// bytes are an error.
   Expected<std::string> read(const std::string& path, std::size_t largest);
   /// The same, nothing when there is no such file.
   Expected<std::optional<std::string>> readIfPresent(const std::string& path, std::size_t largest);
 
-  /// Begins a new content of `path`. Missing folders are made. Temporary files that a killed
+  /// Starts a new version of `path`. Missing folders are made. Temporary files that a killed
   /// process left in the folder are removed once they are older than
   /// `limits::kTemporaryFileSeconds`.
   Expected<NewFile> create(const std::string& path, mode_t mode);
-  /// A file that exists keeps its mode and owner; `mode` is for a new one.
+  /// An existing file keeps its mode and owner; `mode` is for a new one.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Opens a file to append to it; it and its folder are made when missing. Waits for another
-  /// process at most `limits::kFileLockMilliseconds`.
+  /// Opens a file for appending; makes it and its folder when missing. Waits for another process at
+  /// most `limits::kFileLockMilliseconds`.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
   Status rename(const std::string& from, const std::string& to);
   /// Removes a file; a missing one is fine. Durable with the folder's next flush.
   Status remove(const std::string& path);
-  /// The same for what is only in the way: a failure is for the next clean-up.
+  /// The same, but a failure does not matter: the next clean-up tries again.
   void discard(const std::string& path) { removeFile(path.c_str()); }
   /// Makes a folder and those above it.
   Status makeFolders(const std::string& path);
 
-  /// Takes the lock file `path`, made when missing, until the handle is released. Waits for another
+  /// Locks the file `path`, made when missing, until the handle is released. Waits for another
   /// process at most `limits::kFileLockMilliseconds`.
   Expected<Descriptor> lockFile(const std::string& path);
 
-  /// Names in a folder, sorted, without those that begin with a dot; none in a missing folder.
+  /// Names in a folder, sorted, without those that begin with a dot; none for a missing folder.
   Expected<std::vector<std::string>> list(const std::string& folder);
 
   /// Status of a file, links followed; nothing when it cannot be taken.

@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// A line, or a part of it, without spaces, tabs and carriage returns at its ends.
+/// A line, or part of one, without spaces, tabs and carriage returns at its ends.
 std::string_view trimmed(std::string_view text);
 
 class LineReader {
@@ -26,10 +26,10 @@ class LineReader {
   explicit LineReader(const std::string& path, std::uint64_t largest = UINT64_MAX);
 
   /// The next line without its end, valid until the next call. A line that is longer than
-  /// `limits::kTextLineBytes` is cut. Nothing at the end of the file and after a failure.
+  /// `limits::kTextLineBytes` is cut. Nothing at the end of the file or after a failure.
   std::optional<std::string_view> next();
 
-  /// Why the file could not be opened or read on, 0 when nothing failed.
+  /// Why the file could not be opened or read; 0 when nothing failed.
   int errorNumber() const { return errorNumber_; }
 
  private:
@@ -37,7 +37,7 @@ class LineReader {
 
   Descriptor descriptor_;
   int errorNumber_ = 0;
-  std::uint64_t left_;  // bytes that may still be read, should the file grow
+  std::uint64_t left_;  // bytes that may still be read if the file grows
   std::unique_ptr<char[]> buffer_;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;

@@ -1,4 +1,4 @@
-// Small property lists that somebody keeps by hand below the device root.
+// Small property lists below the device root that people edit.
 #pragma once
 
 #include <string>
@@ -10,8 +10,8 @@
 
 namespace tavrel {
 
-/// The dictionary in a file. An empty handle when the file is missing, and, after a line in the
-/// system log, when it cannot be read or is no dictionary.
+/// The dictionary in a file. An empty handle when the file is missing and, with a line in the
+/// system log, when it cannot be read or is not a dictionary.
 plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& propertyLists,
                                      SystemLog& log, const std::string& path);
 

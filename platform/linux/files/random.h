@@ -1,4 +1,4 @@
-// Random bytes, for names and identifiers that must not meet.
+// Random bytes, for names and identifiers that must not collide.
 #pragma once
 
 #include <array>

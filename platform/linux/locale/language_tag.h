@@ -14,15 +14,15 @@ struct LanguageTag {
   std::string variant;   // "valencia", empty when not given
 
   std::string text() const;
-  /// The script that the language is written in in that region when none is given.
+  /// The script of the language in that region, when the tag gives none.
   std::string_view effectiveScript() const;
 
   friend bool operator==(const LanguageTag&, const LanguageTag&) = default;
 };
 
 /// Reads either form, in any case. The encoding of a locale name does not matter, its modifier
-/// gives the script or the variant when it stands for one. Nothing for "C", "POSIX" and whatever is
-/// no name of a language.
+/// gives the script or the variant when it stands for one. Nothing for "C", "POSIX" and texts that
+/// do not name a language.
 std::optional<LanguageTag> parseLanguageTag(std::string_view name);
 
 }  // namespace tavrel

@@ -1,6 +1,6 @@
 // The languages and the region of a Linux device, from its locale configuration.
 //
-// The variables are those of /etc/locale.conf under the device root, or, where that is missing, of
+// The variables are those of /etc/locale.conf under the device root, or, when that is missing, of
 // /etc/default/locale: assignments as a shell reads them (NAME=VALUE, NAME="VALUE").
 //
 // - Preferred languages: the first set one of LC_ALL, LC_MESSAGES and LANG names the language of
@@ -36,8 +36,8 @@ class LinuxLocale final : public Locale {
   using Variables = std::map<std::string, std::string, std::less<>>;
   Variables readVariables();
 
-  /// Calls `use` with each line that says something. False when the file is missing; one that is
-  /// there but cannot be read is logged, once.
+  /// Calls `use` with each significant line. False when the file is missing; logs once a file that
+  /// exists but cannot be read.
   bool readLines(std::string_view path, const std::function<void(std::string_view line)>& use);
 
   const DeviceRoot& root_;

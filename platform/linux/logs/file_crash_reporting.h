@@ -2,10 +2,10 @@
 //
 // Structured records are lines of JSON in
 // /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
-// and day. Each is with the kernel when its call returns; they are written through to storage
-// together, at the clean-up that ends a day's work or with the process. Until then their files are
-// locked. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/
-// support.log, is rolled to support.log.1 and on to support.log.5.
+// and day. A record has reached the kernel when its call returns. The clean-up that ends a day's
+// work, or the end of the process, flushes all records to storage. Until then their files are
+// locked. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is
+// rolled to support.log.1 and on to support.log.5.
 #pragma once
 
 #include <cstdint>
@@ -42,13 +42,13 @@ class FileCrashReporting final : public CrashReporting {
   /// The files that the clean-up removes, without their folder.
   std::vector<std::string> oldRecordFiles();
 
-  /// Whether there is a support log with something in it, which is what rolls.
+  /// Whether there is a support log that is not empty, and so would roll.
   bool hasSupportLog();
 
-  /// Derived from the machine's identifier, which itself never leaves the device: a UUID that is
-  /// the same at every call; "unknown" on a machine without one.
+  /// A UUID derived from the machine's identifier, which itself never leaves the device. The same
+  /// for each call; "unknown" on a machine without an identifier.
   std::string systemIdentifier() override;
-  /// As firmware names it; "unknown" when it does not.
+  /// The name that the firmware gives; "unknown" without one.
   std::string hardwareModel() override;
   std::string osVersion() override;
   std::string incidentIdentifier() override;

@@ -4,9 +4,9 @@
 // .../Submission/outbox/, which an uploader empties. A log is "<name>-<stamp>-<unique>.log"; its
 // metadata is a property list beside it, "<name>-<stamp>-<unique>.metadata.plist".
 //
-// The metadata is put in place before the log and taken away after it. So whoever finds a log finds
-// its metadata; metadata without a log is what a killed process left, means nothing, and is removed
-// once it is older than `limits::kTemporaryFileSeconds`.
+// The metadata appears before the log and disappears after it, so each visible log has its
+// metadata. Metadata without a log comes from a killed process, means nothing, and is removed once
+// it is older than `limits::kTemporaryFileSeconds`.
 #pragma once
 
 #include <string>

@@ -1,6 +1,6 @@
 // Values as JSON on one line.
 //
-// Integers are exact, also beyond what a double holds. What JSON has no form for becomes a string:
+// Integers are exact, even beyond the range of a double. Values that JSON lacks become strings:
 // dates "2026-11-16T18:02:18.000Z", data in hexadecimal, and "nan", "inf", "-inf".
 #pragma once
 

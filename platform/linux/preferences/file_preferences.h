@@ -1,16 +1,16 @@
-// Preferences as property lists, one file a domain:
+// Preferences as property lists, one file per domain:
 // /var/mobile/Library/Preferences/<domain>.plist.
 //
-// A domain is read when it is first asked for. What this process sets is seen by it at once and is
-// kept apart, as changes, until the domain is synchronised: then, under a lock that all writers
-// share, the changes are applied to the file as it is at that moment, so that keys that others have
-// written in the meantime survive. A domain without changes costs no write. On destruction every
-// changed domain is synchronised.
+// A domain is read on first use. What this process sets shows at once, but stays a separate list of
+// changes until the domain is synchronised. Under a lock that all writers share, the changes are
+// then applied to the file as it is at that moment, so that keys that others have written in the
+// meantime survive. A domain without changes costs no write. Destruction synchronises all changed
+// domains.
 //
 // A change that no property list can hold, that needs more than 1 MiB or that no longer fits into
 // the file is dropped with a line, so that the other changes of its domain are written.
 //
-// A file that is no property list is reported once, reads as empty, and is set aside as
+// A file that is not a property list is reported once, reads as empty, and is set aside as
 // "<domain>.plist.corrupt-<stamp>" when the domain is next written.
 #pragma once
 
@@ -49,7 +49,7 @@ class FilePreferences final : public Preferences {
   plist::Dictionary values(std::string_view domain);
 
   /// Whether `domain` can name a file: not empty, at most `limits::kPreferenceDomainBytes` bytes,
-  /// no slash, no control character, no dot in front.
+  /// without slashes and control characters, not beginning with a dot.
   static bool isValidDomain(std::string_view domain);
 
  private:
@@ -63,7 +63,7 @@ class FilePreferences final : public Preferences {
   struct Content {
     std::string bytes;         // empty when there is no file
     plist::Dictionary values;  // may be an empty handle
-    std::string fault;         // why the bytes are no preferences; empty when they are
+    std::string fault;         // why the bytes are not preferences; empty when they are
   };
 
   Domain& domainNamed(std::string_view domain);

@@ -1,7 +1,7 @@
 // The machine's clocks.
 //
-// Ticks are nanoseconds of CLOCK_BOOTTIME: they count from the start of the device, and on through
-// suspension, in which a device of this kind spends most of its life.
+// Ticks are nanoseconds of CLOCK_BOOTTIME: they count from the start of the device and continue
+// during suspension, in which a wearable spends most of its time.
 #pragma once
 
 #include "platform/clock.h"

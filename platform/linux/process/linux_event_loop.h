@@ -9,7 +9,7 @@
 //   auto source = loop.watch(socket, [&] { return takeMessage() ? Activity::Event : ...; });
 //   while (loop.runSlice(10s) == EventLoop::Slice::HandledEvent) {}
 //
-// Durations are those of the monotonic clock: neither a signal nor a clock that is set shortens a
+// Durations follow the monotonic clock: neither a signal nor a change of the clock shortens a
 // slice, and time that the machine sleeps does not count.
 #pragma once
 
@@ -28,7 +28,7 @@ namespace tavrel {
 
 class LinuxEventLoop final : public EventLoop {
  public:
-  /// What a callback did. `Nothing` lets the slice wait on for the time that it has left.
+  /// What a callback did. `Nothing` makes the slice wait for its remaining time.
   enum class Activity { Event, Nothing };
   using Callback = std::function<Activity()>;
 
@@ -63,7 +63,7 @@ class LinuxEventLoop final : public EventLoop {
   /// Calls `callback` whenever `descriptor` is readable or its other end has gone.
   Expected<Source> watch(int descriptor, Callback callback);
 
-  /// Once it has answered `Terminated` it does so ever after.
+  /// Once it has returned `Terminated`, it always does.
   Slice runSlice(std::chrono::milliseconds longest) override;
 
  private:

@@ -1,4 +1,4 @@
-// The channels that a recorded hub knows, with the elements that each shows at every update.
+// The channels that a recorded hub knows, with the elements that each shows in each update.
 #pragma once
 
 #include <cstddef>
@@ -30,8 +30,8 @@ class HubChannel {
 
 class HubChannels {
  public:
-  /// Takes in the "Channels" of a recording. A channel that is known already, or whose elements are
-  /// no whole group of its own, is left out with a line.
+  /// Adds the "Channels" of a recording. A channel that is already known, or whose elements do not
+  /// form whole groups of its own, is left out with a line.
   void add(const plist::Array& channels, std::string_view origin, RefusalLog& refusals);
 
   /// Null when the hub does not know the channel.
@@ -44,7 +44,7 @@ class HubChannels {
     bool operator==(const Key&) const = default;
   };
   struct KeyHash {
-    // Whoever writes a recording chooses the ids.
+    // The author of a recording chooses the ids.
     std::size_t operator()(const Key& key) const {
       return keyedHash(asText(std::as_bytes(std::span(&key, 1))));
     }

@@ -1,10 +1,10 @@
 // The registry of drivers, played back from recordings.
 //
-// Linux has no such registry: what a device's drivers publish and answer is recorded as property
-// lists in /var/lib/tavrel/registry under the device root. docs/registry.md describes the format.
+// Linux has no such registry. Property lists in /var/lib/tavrel/registry under the device root
+// record what a device's drivers publish and answer. docs/registry.md describes the format.
 //
-// A walk goes on over the services as they were when it began. It stops being valid when the
-// generation of the recordings is no longer the one that it began with.
+// A walk goes over the services as they were when it began. It becomes invalid when the generation
+// of the recordings changes.
 #pragma once
 
 #include <memory>
@@ -21,11 +21,12 @@ namespace tavrel {
 
 class RecordedRegistry final : public DriverRegistry {
  public:
-  /// Reads the folder when it is first asked for a service, and again what has changed since.
+  /// Reads the folder on the first request for a service, and later reads changed files again.
   RecordedRegistry(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
                    SystemLog& log);
-  /// Plays one recording, in the form that a file of the folder has. The dictionary is shared: a
-  /// change of it is seen, of its services and channels once its "Generation" has changed too.
+  /// Plays one recording, in the form that a file of the folder has. The dictionary is shared, so
+  /// its changes show; those of its services and channels show once its "Generation" has changed
+  /// too.
   RecordedRegistry(const plist::Dictionary& recording, SystemLog& log);
   ~RecordedRegistry() override;
 

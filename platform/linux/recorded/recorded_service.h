@@ -20,8 +20,8 @@ class RecordedService final : public DriverService {
   KernelReturn name(std::string& name) override;
   std::uint32_t userRetainCount() override;
   plist::Value property(std::string_view key) override;
-  /// The service itself, then its parents, then theirs, each generation in the order in which it is
-  /// recorded; no service is asked twice.
+  /// Searches the service itself, then its parents, then theirs, each generation in recorded order,
+  /// and no service twice.
   plist::Value searchProperty(std::string_view plane, std::string_view key) override;
   /// The only type of connection is 0.
   KernelReturn open(std::uint32_t type, std::unique_ptr<UserClient>& client) override;

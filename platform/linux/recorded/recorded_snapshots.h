@@ -1,6 +1,6 @@
 // Stack snapshots played back from /var/lib/tavrel/registry/stack-snapshot.bin under the device
-// root: the bytes of one snapshot in the kernel's key-coded data format. Without the file capturing
-// fails; so it does, with a line in the system log, when the file cannot be read.
+// root: the bytes of one snapshot in the kernel's key-coded data format. Capturing fails without
+// the file and, with a line in the system log, when the file cannot be read.
 #pragma once
 
 #include "platform/linux/files/device_root.h"

@@ -1,8 +1,8 @@
-// What the recordings of a registry hold, taken together and indexed: services by entry id and by
-// class, and the channels of the hub. docs/registry.md describes the format.
+// The content of a registry's recordings, merged and indexed: services by entry id and by class,
+// and the channels of the hub. docs/registry.md describes the format.
 //
 // The dictionaries of a recording are shared with it, not copied. An entry that cannot be played is
-// left out, and a line in the system log says so. Of the hub only the malformed field is left out.
+// left out, with a line in the system log. In the hub, only the malformed field is left out.
 #pragma once
 
 #include <cstddef>
@@ -21,7 +21,7 @@
 
 namespace tavrel {
 
-/// One recorded document and what messages call it, such as its path.
+/// One recorded document and its name in messages, such as its path.
 struct RecordingPart {
   std::string origin;
   plist::Dictionary content;
@@ -55,7 +55,7 @@ class Recording {
   HubChannels hubChannels_;
 };
 
-/// All parts as one recording, which plays back what they play together.
+/// All parts merged into one recording that plays back the same.
 plist::Dictionary mergedRecording(std::span<const RecordingPart> parts);
 
 /// The sum of the parts' generations, in two's complement.

@@ -21,12 +21,12 @@ class RecordingFolder {
                   SystemLog& log)
       : root_(root), files_(files), propertyLists_(propertyLists), log_(log) {}
 
-  /// Brings `parts` up to date with the "*.plist" files of the folder, in the order of their names.
-  /// Only files that were replaced or changed are read. Answers whether anything was.
+  /// Updates `parts` from the "*.plist" files of the folder, in the order of their names. Reads
+  /// only files that were replaced or changed. Yields whether there were any.
   bool update(std::vector<RecordingPart>& parts);
 
  private:
-  /// Tells one content of a file from another.
+  /// Distinguishes versions of a file.
   struct Stamp {
     std::string path;
     dev_t device;
@@ -44,7 +44,7 @@ class RecordingFolder {
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
   std::vector<Stamp> stamps_;  // one for each part
-  std::string complaint_;      // the last one, so that it is not repeated at every update
+  std::string complaint_;      // the last one, so that updates do not repeat it
 };
 
 }  // namespace tavrel

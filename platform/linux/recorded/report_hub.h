@@ -4,14 +4,14 @@
 //   method 2: takes the channels of interest, makes a buffer for their elements and answers its id
 //   method 3: with a buffer's id, brings the elements in that buffer up to date
 //
-// platform/report_protocol.h has the forms of what is exchanged.
+// platform/report_protocol.h has the protocol.
 //
 // The buffer holds one group of elements for each channel that the hub knows, in the order of
 // interest; channels that it does not know are left out. The first update shows the first group of
-// each channel's sequence, the next one the second, and so on for each buffer on its own. As groups
-// of one channel may differ in length, the buffer has room for the longest; what is free behind the
-// last group is covered by groups of no channel (driver 0, id 2^63), so that a reader that goes
-// from group to group always reaches the end. Before the first update all is zero.
+// each channel's sequence, the next one the second, and so on for each buffer on its own. Groups of
+// one channel may differ in length, so the buffer has room for the longest. Groups that belong to
+// no channel (driver 0, id 2^63) cover the free space after the last group, so that a reader that
+// goes from group to group always reaches the end. Before the first update the buffer is zero.
 #pragma once
 
 #include <memory>

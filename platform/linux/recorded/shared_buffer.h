@@ -1,5 +1,5 @@
-// Memory that a driver of this process shares with its client: an anonymous memory file, written on
-// one side and mapped to be read on the other.
+// Memory that a driver of this process shares with its client: an anonymous memory file that one
+// side writes and the other maps for reading.
 #pragma once
 
 #include <cstddef>
@@ -36,8 +36,8 @@ class MemoryRange {
 
 class SharedBuffer {
  public:
-  /// Zero-filled memory of `size` bytes, which must not be 0. It is all there: writing to it cannot
-  /// run out of memory later.
+  /// Zero-filled memory of `size` bytes, which must not be 0. It is fully allocated: writing to it
+  /// cannot run out of memory later.
   static Expected<SharedBuffer> create(std::size_t size);
 
   /// The driver's side.

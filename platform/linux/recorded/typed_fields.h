@@ -19,7 +19,7 @@ inline std::optional<std::uint64_t> wordOf(const plist::Value& value) {
   return static_cast<std::uint64_t>(number->int64());
 }
 
-/// An integer of 32 bits, signed or not; one that has more reads as the largest.
+/// An integer of 32 bits, signed or not; a wider one reads as the largest.
 inline std::optional<std::uint32_t> halfWordOf(const plist::Value& value) {
   const auto word = wordOf(value);
   if (!word) return std::nullopt;
@@ -28,7 +28,7 @@ inline std::optional<std::uint32_t> halfWordOf(const plist::Value& value) {
   return *word == low || *word == static_cast<std::uint64_t>(asSigned) ? low : UINT32_MAX;
 }
 
-/// A field and what it must be when it is there.
+/// A field and its required type, if it is present.
 struct RecordedField {
   enum class Form : std::uint8_t { Integer, Integers, String, Data, Array, Dictionary };
 
@@ -36,14 +36,13 @@ struct RecordedField {
   Form form;
 };
 
-/// What the value must be, in words, when it is not what the field of its key must be; null
-/// otherwise.
+/// The required type in words when the value has another one; null otherwise.
 const char* missedForm(std::span<const RecordedField> fields, const plist::Entry& entry);
 
 /// What is wrong with the fields of a record, as the end of a message; empty when nothing is.
 std::string faultOf(std::span<const RecordedField> fields, const plist::Dictionary& record);
 
-/// The return code that a recording gives under `key`; 0 when it gives none.
+/// The return code that a recording gives under `key`; 0 without one.
 inline KernelReturn returnCodeOf(const plist::Dictionary& record, std::string_view key) {
   return halfWordOf(record.get(key)).value_or(kKernelSuccess);
 }

@@ -13,13 +13,13 @@
 
 namespace tavrel {
 
-/// Closes the connection when it is released; the service still receives all that was sent.
+/// Closes the connection when released; the service still receives everything that was sent.
 class ServiceClient {
  public:
   static Expected<ServiceClient> connect(const DeviceRoot& root, std::string_view name);
 
-  /// Messages arrive in the order of sending. A service that takes nothing for 30 seconds makes
-  /// this fail. There is no answer: success says that the kernel holds the message.
+  /// Messages arrive in the order of sending. Fails when the service takes nothing for 30 seconds.
+  /// There is no answer: success means that the kernel holds the message.
   Status send(const plist::Dictionary& message);
 
   /// The connected socket.

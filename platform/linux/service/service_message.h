@@ -3,7 +3,7 @@
 // A message of at most `limits::kPacketBytes` is the content of one packet, in either encoding. A
 // larger one travels in one memory file of at most `limits::kMessageFileBytes`, passed as the only
 // descriptor of a packet that is otherwise empty. The file must be sealed against shrinking,
-// growing and writing, so that nothing changes under the reader. Messages are not answered.
+// growing and writing, so that it cannot change while it is read. Messages are not answered.
 //
 //   auto received = receiveMessage(socket, buffer);
 //   if (auto* message = std::get_if<plist::Dictionary>(&received)) use(*message);
@@ -18,19 +18,19 @@
 
 namespace tavrel {
 
-/// The dictionary that the bytes of a message hold; the error says why they hold none.
+/// The dictionary in the bytes of a message, or why there is none.
 Expected<plist::Dictionary> decodeMessage(ByteSpan bytes);
 
 /// No packet has come; the next call may find one.
 struct NoMessage {};
-/// The other end has closed, and everything that it had sent has been received.
+/// The other end has closed, and everything it sent has been received.
 struct ConnectionClosed {};
 
-/// `Error` is a packet that is no message, or a failed connection; the peer is to be dropped.
+/// `Error` is a packet that is not a message, or a failed connection; drop the peer.
 using Received = std::variant<plist::Dictionary, NoMessage, ConnectionClosed, Error>;
 
 /// Receives one packet of a sequenced-packet socket, without waiting. `buffer` must hold
-/// `limits::kPacketBytes`. Whatever descriptors come with the packet are closed.
+/// `limits::kPacketBytes`. All descriptors that come with the packet are closed.
 Received receiveMessage(int socket, MutableByteSpan buffer);
 
 /// Sends one message, waiting as long as the socket's send timeout says while the receiver's

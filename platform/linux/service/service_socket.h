@@ -1,7 +1,6 @@
-// Where named services are found: a sequenced-packet socket below the device root,
-// "/run/tavrel/NAME.socket", with "NAME.lock" beside it, which a process that made the socket
-// itself holds locked. The service manager holds no lock; that it listens is found without
-// connecting.
+// The sockets of named services: a sequenced-packet socket below the device root,
+// "/run/tavrel/NAME.socket". A process that makes the socket itself locks "NAME.lock" in the same
+// folder. The service manager holds no lock; whether it listens is found out without connecting.
 #pragma once
 
 #include <string>
@@ -18,14 +17,14 @@ namespace tavrel {
 
 inline constexpr std::string_view kServiceFolder = "/run/tavrel";
 
-/// True for what can be the name of a service or a notification: letters, digits, ".", "-" and
-/// "_", not led by ".", at most `limits::kServiceNameBytes`.
+/// True for a possible name of a service or a notification: letters, digits, ".", "-" and "_", not
+/// beginning with ".", at most `limits::kServiceNameBytes`.
 bool isServiceName(std::string_view name);
 
 std::string serviceSocketPath(const DeviceRoot& root, std::string_view name);
 
-/// The address of a socket file. Paths that are longer than an address holds are reached through
-/// a descriptor of their folder, which lives as long as the address.
+/// The address of a socket file. A path too long for an address is reached through a descriptor of
+/// its folder, which lives as long as the address.
 class SocketAddress {
  public:
   static Expected<SocketAddress> of(const std::string& path);
@@ -38,14 +37,14 @@ class SocketAddress {
   Descriptor folder_;
 };
 
-/// A listening socket that this process has made. The file goes with it, unless another has taken
-/// its place.
+/// A listening socket that this process has made. Its file is removed with it, unless another has
+/// taken its place.
 class ServiceSocket {
  public:
-  /// Listens at the path of the service `name`, with mode 0600. A file that a killed process left
-  /// is replaced; where somebody listens this fails.
+  /// Listens at the path of the service `name`, with mode 0600. Replaces a file that a killed
+  /// process left; fails when a process listens there.
   static Expected<ServiceSocket> open(const DeviceRoot& root, std::string_view name);
-  /// Takes over a socket that another process has made and whose file it keeps.
+  /// Takes over a socket that another process has made; that process keeps the file.
   explicit ServiceSocket(Descriptor socket) : socket_(std::move(socket)) {}
 
   ServiceSocket(ServiceSocket&&) noexcept = default;

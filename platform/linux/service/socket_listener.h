@@ -29,7 +29,7 @@ class SocketListener final : public ServiceListener {
   class Peer;
 
   Activity acceptPeer();
-  /// True for a user who may use the service; says so in the log when not.
+  /// True for a user who may use the service; otherwise logs the refusal.
   bool admits(const ucred& user);
   void acceptFailed(int code);
   void pause();
@@ -49,8 +49,8 @@ class SocketListener final : public ServiceListener {
   std::uint64_t lastPeerId_ = 0;
   int silentInARow_ = 0;
   bool paused_ = false;
-  bool isShort_ = false;   // of what a new peer needs, when one was last tried
-  Descriptor retryTimer_;  // made in advance: there may be no descriptor when it is needed
+  bool isShort_ = false;   // of resources for a new peer, at the last attempt
+  Descriptor retryTimer_;  // made in advance, since descriptors may be short when it is needed
   LinuxEventLoop::Source retry_;
 };
 

@@ -1,16 +1,16 @@
-// Named services as sequenced-packet sockets. The messages are those of service_message.h, the
-// places those of service_socket.h; a socket that the service manager hands over comes first.
+// Named services as sequenced-packet sockets. service_message.h has the messages, service_socket.h
+// the paths. A socket from the service manager takes precedence.
 //
 //   SocketServices services(loop, root, log);
 //   auto listener = services.createListener("com.norvane.tallied.tavrel");
 //   listener->setPeerHandler(takePeer);  // sets the peer's event handler and resumes it
 //   listener->resume();
 //
-// Who may talk: root and the user that this process runs as. Others are refused, and so are packets
-// that are no message: the peer is dropped with a log line, of which there are at most
-// `limits::kRefusalLinesPerMinute` a minute.
+// Permitted peers: root and the user of this process. Others are refused, and so are packets that
+// are not messages: the peer is dropped with a log line, at most `limits::kRefusalLinesPerMinute` a
+// minute.
 //
-// What counts as an event, and so makes the wait for the next one begin anew:
+// These count as an event, and so restart the wait for the next one:
 //   - a message, whatever it says;
 //   - a new peer, and its end, by itself or because it was dropped. Of new peers in a row, with no
 //     message from anybody in between, only the first `limits::kSilentConnections` count; further
@@ -19,9 +19,9 @@
 // A peer that was refused never counts.
 //
 // Beyond `limits::kServicePeers` peers new ones wait in the kernel's queue until a peer leaves;
-// when the system is short of descriptors or memory, also until the next try a second later. Nobody
-// is written to, so a peer that does not read costs nothing; one that writes too fast is held up by
-// the kernel.
+// when the system is short of descriptors or memory, also until the next try a second later. The
+// service writes to no peer, so a peer that does not read costs nothing; the kernel holds up one
+// that writes too fast.
 #pragma once
 
 #include <memory>

@@ -5,9 +5,9 @@
 //   (*batch)->setScalar(day, "com.example.starts", 3);
 //   (*batch)->commit();
 //
-// Rows wait in memory up to a bound. From the first that is written until the commit other writers
-// wait, so that a small batch holds them up only while it is committed. A batch that is not
-// committed leaves nothing. After a failure it can only be given up.
+// Rows wait in memory up to a bound. Other writers wait from the first write until the commit, so a
+// small batch holds them up only while it commits. A batch that is not committed leaves nothing
+// behind. After a failure it can only be dropped.
 #pragma once
 
 #include <cstdint>
@@ -40,7 +40,7 @@ class SqliteBatch {
   Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
                      double value);
 
-  /// Keeps the changes. The batch is spent.
+  /// Keeps the changes and ends the batch.
   Status commit();
 
   /// As `setScalar` and `commit`, for use inside the store: they throw `StoreFailure`.
@@ -64,7 +64,7 @@ class SqliteBatch {
     std::string key;
     std::string records;
   };
-  // A scalar that waits to be written; its key stands in `scalarKeys_`.
+  // A scalar that waits to be written; its key is in `scalarKeys_`.
   struct PendingScalar {
     std::int32_t day;
     std::uint32_t keySize;

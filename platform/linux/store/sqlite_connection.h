@@ -23,11 +23,11 @@ struct sqlite3_stmt;
 namespace tavrel {
 
 enum class StoreFault : std::uint8_t {
-  Damaged,  // SQLite finds the file corrupt or no database at all
+  Damaged,  // SQLite finds the file corrupt, or not a database
   Busy,     // another process held its lock for too long
-  Refused,  // the system does not let this user, or anybody, at the file
-  Device,   // the system fails at reading or writing, for a fault or for want of space
-  Foreign,  // something that this program did not make or does not know, and leaves alone
+  Refused,  // the system denies this user, or everybody, the file
+  Device,   // reading or writing fails, because of a fault or lack of space
+  Foreign,  // a file that this program did not make or does not know, and leaves alone
   Other,
 };
 
@@ -40,16 +40,16 @@ struct StoreFailure : std::exception {
   std::string message;
 };
 
-/// What can be done about a failure of the system; `otherwise` when its code tells nothing.
+/// What can be done about a failure of the system; `otherwise` when its code does not say.
 const char* adviceFor(int systemCode, const char* otherwise);
 
-/// How long locks of other processes are waited for: one amount for all that share it, which the
-/// moments slept use up and nothing fills again. For one thread.
+/// How long to wait for locks of other processes: one amount that all waits share and use up; it is
+/// never refilled. For one thread.
 class BusyBudget {
  public:
   explicit BusyBudget(int milliseconds) : left_(std::chrono::milliseconds(milliseconds)) {}
 
-  /// Waits a moment before a lock is tried again; false when the time is used up.
+  /// Waits a moment before the next attempt to lock; false when the time is used up.
   bool wait();
 
  private:
@@ -60,8 +60,8 @@ class SqliteConnection {
  public:
   enum class Access : std::uint8_t {
     Create,     // read and write; an absent file is created
-    Read,       // read; the write-ahead log is taken part in as far as the user may
-    Immutable,  // read a file that nobody writes, without locks and without a log
+    Read,       // read; uses the write-ahead log as far as the user may
+    Immutable,  // read a file that no process writes, without locks or a log
   };
 
   SqliteConnection(const std::string& path, Access access, std::shared_ptr<BusyBudget> busy);
@@ -69,14 +69,14 @@ class SqliteConnection {
   SqliteConnection(SqliteConnection&& other) noexcept;
   SqliteConnection& operator=(SqliteConnection&& other) noexcept;
 
-  /// Runs statements that yield nothing of interest.
+  /// Runs statements and ignores their rows.
   void execute(const char* sql);
 
   /// The first column of the first row.
   std::int64_t integer(std::string_view sql);
 
-  /// Moves the write-ahead log into the database and empties it. False when other processes were
-  /// in the way; as much as possible has then been moved.
+  /// Moves the write-ahead log into the database and empties it. False when other processes
+  /// prevented part of that; as much as possible has then been moved.
   bool checkpoint();
 
   sqlite3* handle() const { return handle_; }

@@ -1,7 +1,7 @@
 // The reader of the statistics store.
 //
 // Each query sees the store as it was when the query began, whatever others write meanwhile. The
-// values of a distribution are read only when its enumerator is asked, one chunk at a time.
+// values of a distribution are read only on demand, one chunk at a time.
 //
 //   auto history = store.openHistory();
 //   if (history) (*history)->walkScalars("com.example.", first, last, handler);
@@ -22,7 +22,7 @@ namespace tavrel {
 class SqliteHistory : public BHHistory {
  public:
   /// A history without a store has no rows. `identity` is the store's file as it was before it was
-  /// opened. The services behind `site` must outlive the history.
+  /// opened. The services of `site` must outlive the history.
   SqliteHistory(StoreSite site, std::optional<FileIdentity> identity,
                 std::optional<ReadableStore> store);
 
@@ -33,7 +33,7 @@ class SqliteHistory : public BHHistory {
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override;
 
-  /// False when there is no store yet, or none that could be read.
+  /// False when there is no store yet, or when it could not be read.
   bool hasStore() const { return store_.has_value(); }
 
   /// `count` is the number of values, known without reading them.
@@ -43,7 +43,7 @@ class SqliteHistory : public BHHistory {
 
   /// Rows whose key begins with `prefix`, from `firstDay` to `lastDay`, both included, ordered by
   /// day and then by key. On failure the rows before it have been delivered. A distribution whose
-  /// values could not all be read fails the walk at its end, after the rows behind it.
+  /// values could not all be read fails the walk at its end, after all other rows.
   Status walkScalars(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                      const ScalarRowHandler& rowHandler);
   Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
@@ -55,14 +55,14 @@ class SqliteHistory : public BHHistory {
     std::int32_t firstDay = 0;
     std::int32_t lastDay = 0;
   };
-  /// The days of which anything is held.
+  /// The days that have any rows.
   Expected<Holdings> holdings();
 
  private:
   enum class Order : std::uint8_t { KeyThenDay, DayThenKey };
   struct Selection;
   void readScalars(const Selection& selection, const ScalarRowHandler& rowHandler);
-  /// Damage that SQLite finds ends the walk; of other rows with missing values `tell` is told.
+  /// Damage that SQLite finds ends the walk; other rows with missing values are reported to `tell`.
   using FailureHandler = std::function<void(const StoreFailure& failure)>;
   void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
                          const FailureHandler& tell);

@@ -1,5 +1,5 @@
 // The store's schema and its statements, and opening a file that has it. docs/store.md describes
-// the tables for those who read the file with other tools.
+// the tables for users of other tools.
 #pragma once
 
 #include <cstddef>
@@ -36,7 +36,7 @@ inline constexpr std::string_view kDistributionsByDay =
     "SELECT key, day, series, count FROM distributions WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
     "AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
 
-/// ?1 first chunk, ?2 chunk behind the last.
+/// ?1 first chunk, ?2 chunk after the last.
 inline constexpr std::string_view kChunks =
     "SELECT data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
 
@@ -45,8 +45,9 @@ inline constexpr std::string_view kChunks =
 /// A chunk's number is its series' number and, in the low bits, its place in the series.
 inline constexpr int kChunkOrdinalBits = 20;
 
-/// Every chunk of a series but the last is full. 12 KiB: few enough bytes that one more value does
-/// not rewrite much, enough that a million values are read in a thousand steps; five fill a page.
+/// Every chunk of a series but the last is full. 12 KiB is little enough that one more value does
+/// not rewrite much, and enough that a million values take a thousand steps to read; five chunks
+/// fill a page.
 inline constexpr std::size_t kValuesPerChunk = 1024;
 
 /// Opens the store for writing and gives an empty file the schema. The folder must exist.
@@ -55,7 +56,7 @@ SqliteConnection openStoreForWriting(const std::string& path,
 
 struct ReadableStore {
   SqliteConnection connection;
-  /// Opened without locks because a log could not be taken part in.
+  /// Opened without locks because the log could not be used.
   bool immutable;
 };
 

@@ -1,4 +1,4 @@
-// Where the statistics store lies, and what is done when its file turns out to be unusable.
+// The path of the statistics store, and what happens when its file turns out to be unusable.
 #pragma once
 
 #include <cstdint>
@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// Which file stands at a path.
+/// The identity of the file at a path.
 struct FileIdentity {
   std::uint64_t device = 0;
   std::uint64_t inode = 0;
@@ -26,11 +26,11 @@ struct FileIdentity {
   static std::optional<FileIdentity> of(const std::string& path);
 };
 
-/// Held while the store's file is created or set aside, so that of several processes one does it.
-/// The lock is on the store's folder and goes with the process.
+/// Held while the store's file is created or set aside, so that only one of several processes does
+/// it. The lock is on the store's folder and ends with the process.
 class StoreFolderLock {
  public:
-  /// Throws `StoreFailure` when the lock is not to be had in time.
+  /// Throws `StoreFailure` when the lock cannot be taken in time.
   StoreFolderLock(const std::string& storePath, BusyBudget& busy);
   ~StoreFolderLock();
   StoreFolderLock(const StoreFolderLock&) = delete;
@@ -40,7 +40,7 @@ class StoreFolderLock {
   int descriptor_;
 };
 
-/// The store's path and the services that its failures are told to. The services must outlive it.
+/// The store's path, and the services to which failures are reported, which must outlive it.
 struct StoreSite {
   std::string path;
   std::shared_ptr<BusyBudget> busy;
@@ -49,7 +49,7 @@ struct StoreSite {
   SystemLog& log;
   /// A damaged store stays where it is: for readers that change nothing.
   bool leavesDamaged = false;
-  /// Failures that only somebody's intervention ends: they are told once.
+  /// Failures that last until somebody intervenes; they are reported once.
   std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
 
   /// "statistics store PATH: MESSAGE".
@@ -59,8 +59,8 @@ struct StoreSite {
   void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
 
   /// Moves a damaged store with its log files to names of their own, counts it and says so.
-  /// `damaged` is the file that was found damaged: nothing is done when another process has
-  /// already replaced it. Yields the failure with what stood in the way when it could not be moved.
+  /// `damaged` is the file that was found damaged: nothing is done when another process has already
+  /// replaced it. Yields the failure; when the store could not be moved, with the reason.
   std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
                                        const StoreFailure& failure) const;
 };

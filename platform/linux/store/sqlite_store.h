@@ -1,15 +1,15 @@
 // The statistics store in a SQLite file of the device.
 //
-// The file is opened when there is something to write or to read and closed again, so that a run
-// with nothing to do never touches it. Scalars that a run sets wait in memory and are committed in
-// one transaction at the checkpoint and at the end of the run.
+// The file is opened only to read or write and then closed, so that a run with nothing to do never
+// touches it. Scalars that a run sets wait in memory; the checkpoint and the end of the run each
+// commit them in one transaction.
 //
 //   SqliteStore store(root, clock, preferences, log);
 //   store.BHClientSetValueForScalarKey("com.example.starts", 3);
 //   store.commit();
 //
-// Failures are told to the system log in one line each; values that could not be committed are
-// kept for the next attempt.
+// Each failure is one line in the system log; values that could not be committed are kept for the
+// next attempt.
 #pragma once
 
 #include <cstdint>
@@ -38,9 +38,8 @@ inline constexpr std::string_view kStorePath = "/var/mobile/Library/Brimhold/BHD
 
 class SqliteStore : public StatisticsStore {
  public:
-  /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited
-  /// for, in all operations together. `leavesDamaged`: a damaged store is reported and not set
-  /// aside.
+  /// The services must outlive the store. `busyMilliseconds`: how long to wait for a locked store,
+  /// all operations together. `leavesDamaged`: report a damaged store but do not set it aside.
   SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences, SystemLog& log,
               int busyMilliseconds = limits::kStoreBusyMilliseconds, bool leavesDamaged = false);
   ~SqliteStore() override;
@@ -48,8 +47,8 @@ class SqliteStore : public StatisticsStore {
   std::int32_t BHDaysSince1970() override;
   plist::Date dateForDaysSince1970(std::int32_t day) override;
 
-  /// When other processes are reading or writing all the time that is waited for, what they still
-  /// need stays in the log; a line says so, and the next checkpoint moves it.
+  /// When other processes keep reading or writing for the whole wait, what they still need stays in
+  /// the log; a line says so, and the next checkpoint moves it.
   void BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
@@ -70,8 +69,8 @@ class SqliteStore : public StatisticsStore {
   SqliteConnection openForWriting();
   std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);
 
-  /// Runs `operation` with the identity of the store's file. When it finds the store damaged, that
-  /// is set aside and the operation runs once more. Yields what then still is in the way.
+  /// Runs `operation` with the identity of the store's file. When it finds the store damaged, sets
+  /// that aside and runs the operation once more. Yields the remaining failure.
   template <class Operation>
   std::optional<StoreFailure> attempt(Operation operation);
 

@@ -1,4 +1,4 @@
-// The system log: the journal, else standard error.
+// The system log: the journal, or standard error without one.
 //
 // Under the service manager standard error is connected to the journal, and JOURNAL_STREAM says to
 // which stream. Entries then go to the journal's own socket, so that an entry of several lines
@@ -6,7 +6,7 @@
 // written on standard error at once, as "TIME LEVEL message", further lines indented and control
 // characters escaped.
 //
-// Every level is written; what to keep and what to show is the journal's business.
+// All levels are written; the journal decides what to keep and what to show.
 #pragma once
 
 #include <string>

@@ -1,4 +1,4 @@
-// Log lines about refusals, of which there are only so many.
+// Log lines about refusals, limited in number.
 #pragma once
 
 #include <chrono>
@@ -8,8 +8,8 @@
 
 namespace tavrel {
 
-/// Writes lines about refusals until there were `limits::kRefusalLinesPerMinute` of them in a
-/// minute, and then says how many were left out. The log must outlive it.
+/// Writes at most `limits::kRefusalLinesPerMinute` lines about refusals in a minute, and then says
+/// how many were left out. The log must outlive it.
 class RefusalLog {
  public:
   explicit RefusalLog(SystemLog& log) : log_(log) {}
