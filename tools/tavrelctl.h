@@ -1,4 +1,4 @@
-// The command line tavrelctl, apart from the process around it.
+// The command line of tavrelctl, without the process around it.
 #pragma once
 
 #include <string>

@@ -1,4 +1,4 @@
-// tavrelctl tasking: what the device is tasked with.
+// tavrelctl tasking: the scheduled and the applied tasking.
 #pragma once
 
 #include "tools/shared/tool_context.h"

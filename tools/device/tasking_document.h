@@ -5,8 +5,8 @@
 //    "TaskingPayload": [
 //      {"Domain": "com.norvane.da", "Key": "AggressiveSubmissionDays", "Value": 3}]}
 //
-// TaskingDigest may be any value, and may be absent. TaskingPayload may be absent: the device then
-// takes back what it applied before and applies nothing.
+// TaskingDigest may be any value, and may be absent. Without TaskingPayload the device undoes what
+// it applied before and applies nothing.
 #pragma once
 
 #include <string>
@@ -16,8 +16,8 @@
 
 namespace tavrel {
 
-/// What keeps a device from applying the tasking as written, one line each, such as
-/// "TaskingPayload[3]/Domain: is missing". Empty for a good one.
+/// The reasons why a device would not apply the tasking as written, one line each, such as
+/// "TaskingPayload[3]/Domain: is missing". Empty for a good tasking.
 std::vector<std::string> checkTasking(const plist::Value& tasking);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The logs that were filed for submission, as the tool lists them.
+// Lists the logs that were filed for submission.
 #pragma once
 
 #include <optional>
@@ -12,9 +12,9 @@
 
 namespace tavrel {
 
-/// A log, with what the file system knows of its file.
+/// A log, with the status of its file.
 struct FiledLog : FileSubmission::FiledLog {
-  std::optional<struct stat> status;  // nothing when it cannot be told
+  std::optional<struct stat> status;  // nothing when unknown
 };
 
 /// "pending" or "outbox".
@@ -26,7 +26,7 @@ std::string fileNameOf(const FiledLog& log);
 /// The logs of both folders, oldest first.
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context);
 
-/// Says once why logs stand without metadata.
+/// Says once why logs have no metadata.
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs);
 
 }  // namespace tavrel

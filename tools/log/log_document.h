@@ -1,4 +1,4 @@
-// A tallied log as people and programs read it.
+// Shows a tallied log to people and programs.
 #pragma once
 
 #include <cstddef>
@@ -13,24 +13,23 @@
 
 namespace tavrel {
 
-/// What stands around a log: where it is, and what the submission service was told.
+/// What surrounds a log: its place, and the submission service's metadata.
 struct LogEnvelope {
   std::string place;  // "pending", "outbox", "preview" or "file"
   std::string path;   // empty for a preview
   plist::Dictionary metadata;
 };
 
-/// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
-/// a tallied log has it. `document` is the
-/// log when it is a property list.
+/// The table form: header, metadata, scalars, distributions, histograms as bars, and faults.
+/// `document` is the log when it is a property list.
 void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dictionary& document,
               std::optional<std::size_t> columns);
 
-/// The same facts. The standard deviation is that of the values themselves: the root of the sum of
-/// squared deviations divided by the count.
+/// The same facts. The standard deviation is that of the population: the root of the sum of squared
+/// deviations divided by the count.
 Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document);
 
-/// The lines of a log's envelope, which also stand before logs of other forms.
+/// The lines of a log's envelope, which also precede logs of other forms.
 void printEnvelope(std::ostream& out, const LogEnvelope& envelope);
 Json jsonOfEnvelope(const LogEnvelope& envelope);
 

@@ -1,4 +1,4 @@
-// What in a document is not as a tallied log has it.
+// Finds the faults of a document that should be a tallied log.
 #pragma once
 
 #include <string>
@@ -8,7 +8,7 @@
 
 namespace tavrel {
 
-/// Whether a property list is meant to be a tallied log: a dictionary with the parts that make one.
+/// Whether a property list is meant to be a tallied log: a dictionary with a log's main entries.
 bool isTalliedLog(const plist::Value& document);
 
 /// Members of a wrong kind or without a meaning, such as "BHScalars: is a string, not a

@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// The bytes of the buffer. The error says which entry is wrong.
+/// Yields the bytes of the buffer. The error says which entry is wrong.
 Expected<std::string> buildStatistics(const plist::Value& document);
 
 }  // namespace tavrel

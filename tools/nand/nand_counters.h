@@ -1,4 +1,4 @@
-// The counters of a NAND chip for people and programs.
+// Shows the counters of a NAND chip to people and programs.
 #pragma once
 
 #include <iosfwd>
@@ -13,7 +13,7 @@ namespace tavrel {
 /// {"parser": …, "counters": {"readStage": […], …}}
 Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters);
 
-/// Error bins as bars, the other arrays in rows of eight; arrays of zeros on one line.
+/// Error bins as bars, other arrays in rows of eight, arrays of zeros on one line.
 void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
                    std::optional<std::size_t> columns);
 

@@ -13,7 +13,7 @@ namespace tavrel {
 /// says why a descriptor was refused.
 Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor);
 
-/// Hands out one snapshot that was taken before, again and again. The bytes are borrowed.
+/// Yields one given snapshot again and again. The bytes are borrowed.
 class TakenSnapshot final : public StackSnapshots {
  public:
   explicit TakenSnapshot(ByteSpan bytes) : bytes_(bytes) {}

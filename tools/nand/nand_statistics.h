@@ -1,4 +1,4 @@
-// A parsed statistics buffer for people and programs, and what differs between two of them.
+// Shows a parsed statistics buffer, or the differences of two, to people and programs.
 #pragma once
 
 #include <cstdint>
@@ -17,11 +17,11 @@ namespace tavrel {
 /// {"result": …, "fields": {…}, "entries": [[name, value], …]}
 Json jsonOfStatistics(int result, const ASPContext& context);
 
-/// One line a statistic, in the order of the buffer.
+/// One line per statistic, in the order of the buffer.
 void printStatistics(std::ostream& out, const ASPContext& context,
                      std::optional<std::size_t> columns);
 
-/// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for one that can.
+/// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for a good buffer.
 std::optional<std::string> faultOfStatistics(ByteSpan buffer);
 
 /// A statistic whose value differs, or that only one of two buffers has. The name is borrowed from
@@ -32,13 +32,13 @@ struct StatisticDifference {
   std::optional<std::uint64_t> after;
 };
 
-/// In the order of the first buffer, then what only the second has. A name that stands several
-/// times in a buffer is compared first with first, second with second.
+/// In the order of the first buffer, then those that only the second has. When a name occurs
+/// several times, the first is compared with the first, the second with the second.
 std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
                                                     const ASPContext& after);
 
-/// [{"statistic": …, "before": …, "after": …, "change": …}]; what is not there, and a change of
-/// more than 63 bits, is null.
+/// [{"statistic": …, "before": …, "after": …, "change": …}]; missing values, and changes of more
+/// than 63 bits, are null.
 Json jsonOfDifferences(const std::vector<StatisticDifference>& differences);
 
 void printDifferences(std::ostream& out, const std::vector<StatisticDifference>& differences,

@@ -1,4 +1,4 @@
-// The NAND information for people: geometry, wear, traffic, write amplification, histograms.
+// Shows the NAND information to people: geometry, wear, traffic, write amplification, histograms.
 #pragma once
 
 #include <cstddef>
@@ -9,9 +9,8 @@
 
 namespace tavrel {
 
-/// Everything that the dictionary holds, in groups; keys without their common prefix. What belongs
-/// to no group stands in the last one. Figures that follow from several others (capacity, write
-/// amplification) say from which.
+/// Everything in the dictionary, in groups, the last one for all other keys; keys lack their common
+/// prefix. Figures that follow from others (capacity, write amplification) say from which.
 void printNandInfo(std::ostream& out, const plist::Dictionary& info,
                    std::optional<std::size_t> columns);
 

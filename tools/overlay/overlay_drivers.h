@@ -1,4 +1,4 @@
-// A driver registry whose use is told.
+// A driver registry that reports its use.
 #pragma once
 
 #include <memory>
@@ -8,8 +8,8 @@
 
 namespace tavrel {
 
-/// Services and connections go through to `below`: recorded drivers change nothing on disk. What it
-/// gives out may outlive neither `below` nor `events`.
+/// Services and connections go through to `below`: recorded drivers change nothing on disk. Objects
+/// from it may outlive neither `below` nor `events`.
 class OverlayDrivers final : public DriverRegistry {
  public:
   OverlayDrivers(DriverRegistry& below, const OverlayEvents& events)

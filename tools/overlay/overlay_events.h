@@ -1,4 +1,4 @@
-// What a run over an overlay reads, would write and says, one event at a time.
+// What a run over an overlay reads, would write and logs, one event at a time.
 #pragma once
 
 #include <cstdint>
@@ -12,22 +12,22 @@ namespace tavrel {
 
 struct OverlayEvent {
   enum class Kind : std::uint8_t {
-    // What is read. The value is what came back, null for nothing.
+    // Reads. The value is the result, null for nothing.
     Preference,      // "domain key"
-    File,            // its path; the bytes that it has, or why it cannot be read
+    File,            // its path; its size in bytes, or why it cannot be read
     Answer,          // a question to the device
     Control,         // a system control; data, or the error as text
     Fact,            // of the device, by its name
     Library,         // a library or a function of it; whether it was found
     Statistics,      // "scalars of day 20000"; the number of rows
     Driver,          // the class or name of a driver; whether it was found
-    Drivers,         // what drivers are looked for; how that went
+    Drivers,         // the drivers looked for; the outcome
     DriverProperty,  // "driver key"; containers by their kind
-    DriverCall,      // "driver method 8"; how that went
-    // What would be changed. The value is what would be written.
+    DriverCall,      // "driver method 8"; the outcome
+    // Changes. The value is what would be written.
     SetPreference,     // "domain key"
     RemovePreference,  // "domain key"
-    WritePreferences,  // a domain that would be written through to storage
+    WritePreferences,  // a domain that would be written to storage
     SetScalar,         // its key
     Checkpoint,
     Record,      // "type 176"; the record
@@ -36,9 +36,9 @@ struct OverlayEvent {
     Notification,
     CleanUp,   // what would be removed, and its files
     RollOver,  // what would be rolled
-    // What is said.
+    // Messages.
     LogLine,    // the level's name; the message
-    ErrorText,  // standard error; the text as it is, with or without a line end
+    ErrorText,  // standard error; the exact text, with or without a line end
     OutputText,
   };
 
@@ -47,8 +47,7 @@ struct OverlayEvent {
   plist::Value value;
 };
 
-/// Hands events out as they happen. A value may be changed by the run once the handler has
-/// returned.
+/// Delivers events as they happen. The run may change a value once the handler has returned.
 class OverlayEvents {
  public:
   using Handler = std::function<void(const OverlayEvent&)>;

@@ -31,8 +31,7 @@ class OverlayPlatform {
 
   Platform& platform();
 
-  /// Called for everything that is read, would be written, or is said, as it happens. The handler
-  /// must not use the platform.
+  /// Called for each read, change and message as it happens. The handler must not use the platform.
   void setEventHandler(OverlayEvents::Handler handler);
   /// Makes `content` the content of the device's file at `path`.
   void replaceFile(std::string path, std::string content);

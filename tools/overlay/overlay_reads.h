@@ -1,4 +1,4 @@
-// Services that a run only reads from, each telling what was read.
+// Services from which a run only reads; each reports what was read.
 #pragma once
 
 #include <cstring>
@@ -154,7 +154,7 @@ class OverlayLocale final : public Locale {
   const OverlayEvents& events_;
 };
 
-/// Functions of libraries that reach preferences reach those of the overlay.
+/// Library functions that access preferences access those of the overlay.
 class OverlayLibrary final : public DynamicLibrary {
  public:
   OverlayLibrary(std::unique_ptr<DynamicLibrary> below, Preferences& preferences,

@@ -1,5 +1,5 @@
-// Services that a run writes to. What it writes stays in memory and is told; what it reads comes
-// from the device, and from what it wrote before.
+// Services to which a run writes. Its writes stay in memory and are reported; its reads come from
+// the device and from its earlier writes.
 #pragma once
 
 #include <map>
@@ -15,7 +15,7 @@
 
 namespace tavrel {
 
-/// A log that was handed to the submission service.
+/// A log that was passed to the submission service.
 struct CapturedLog {
   std::string type;
   std::string name;
@@ -134,7 +134,7 @@ class OverlaySubmission final : public SubmissionService {
   const OverlayEvents& events_;
 };
 
-/// A history that tells how many rows a query had.
+/// A history that reports how many rows a query had.
 class OverlayHistory final : public BHHistory {
  public:
   OverlayHistory(std::unique_ptr<BHHistory> below, const OverlayEvents& events)

@@ -1,4 +1,4 @@
-// Waits for changes in a folder that need not exist yet.
+// Waits for changes in a folder, which need not exist yet.
 #pragma once
 
 #include <functional>
@@ -8,8 +8,8 @@
 
 namespace tavrel {
 
-/// Calls `look` at once and after every change in the folder, until SIGINT or SIGTERM comes or
-/// `look` answers false. What happens while it looks is seen by the next look.
+/// Calls `look` at once and after each change in the folder, until SIGINT or SIGTERM arrives or
+/// `look` returns false. A change during one call leads to another.
 Status watchFolder(const std::string& folder, const std::function<bool()>& look);
 
 }  // namespace tavrel

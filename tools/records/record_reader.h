@@ -11,15 +11,15 @@
 
 namespace tavrel {
 
-/// Hands out whole lines, each once. A file that has become shorter is read from its beginning.
+/// Yields whole lines, each once. A file that has become shorter is read from its beginning.
 class RecordReader {
  public:
   using LineHandler = std::function<void(std::string_view line, std::uint64_t number)>;
 
   explicit RecordReader(std::string path) : path_(std::move(path)) {}
 
-  /// The lines that came since the last call. With `takesRest` also what stands behind the last
-  /// line end. A line of more than `limits::kStructuredRecordFileBytes` is an error.
+  /// The lines since the last call. With `takesRest` also the text after the last line end. A line
+  /// of more than `limits::kStructuredRecordFileBytes` is an error.
   Status read(bool takesRest, const LineHandler& handler);
 
   const std::string& path() const { return path_; }
@@ -37,7 +37,7 @@ struct StructuredRecord {
   plist::Dictionary content;
 };
 
-/// The record of one line. The error says why it is none.
+/// The record in one line. The error says why there is none.
 Expected<StructuredRecord> parseRecord(std::string_view line);
 
 /// A record on one line: "id=4 count=2 stages=[1,2,3]", the last for "stages[0]", "stages[1]" and

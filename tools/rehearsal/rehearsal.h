@@ -1,4 +1,4 @@
-// A daily run that changes nothing, as the steps that it takes.
+// A daily run that changes nothing, recorded step by step.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@ namespace tavrel {
 class LinuxPlatform;
 
 enum class RehearsedRun : std::uint8_t {
-  Gated,   // yesterday, unless it is done
+  Gated,   // yesterday, unless it was done
   Forced,  // yesterday in any case
   Today,   // today
 };

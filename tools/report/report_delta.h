@@ -15,8 +15,8 @@ struct PartialDelta {
   std::string firstLeftOut;  // "DRIVER GROUP SUBGROUP NAME: REASON"
 };
 
-/// For samples whose delta cannot be had as a whole. A channel of no earlier sample keeps its
-/// values.
+/// For samples whose delta cannot be computed as a whole. A channel without an earlier sample keeps
+/// its values.
 PartialDelta subtractEach(const plist::Dictionary& previous, const plist::Dictionary& current);
 
 }  // namespace tavrel

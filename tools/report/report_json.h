@@ -10,7 +10,7 @@ namespace tavrel {
 void addChannels(JsonList& list, const plist::Dictionary& channels);
 
 /// The same with timestamp and "value", "values", "states" or "buckets" according to the format.
-/// What a channel does not tell is null. Counts of a delta are differences, and may be negative.
+/// Unknown values are null. Counts of a delta are differences, and may be negative.
 void addSamples(JsonList& list, const plist::Dictionary& samples, bool isDelta);
 
 }  // namespace tavrel

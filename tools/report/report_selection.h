@@ -1,4 +1,4 @@
-// Which report channels a command is about.
+// Selects the report channels of a command.
 #pragma once
 
 #include <cstdint>
@@ -15,7 +15,7 @@
 
 namespace tavrel {
 
-/// Conditions from the command line, checked there; empty where there is none. All must hold.
+/// Conditions from the command line, already checked; empty for none. All must hold.
 struct ReportSelection {
   std::string group;
   std::string subGroup;
@@ -27,8 +27,8 @@ struct ReportSelection {
 
 void addSelectionOptions(Command command, ReportSelection& selection);
 
-/// The channels that drivers publish and the selection keeps, filed by driver and group. The error
-/// says why channels cannot be had.
+/// The published channels that the selection keeps, filed by driver and group. The error says why
+/// there are none.
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection);
 
 /// All channels of an aggregate, in its order.
@@ -37,10 +37,10 @@ std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);
 inline constexpr std::string_view kLookAtDrivers =
     "'tavrelctl registry list' shows the drivers and the hub";
 
-/// The words of an error that has some besides its code.
+/// The words of an error that has more than its code.
 std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error);
 
-/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without what is not known.
+/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without unknown parts.
 std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
                           std::string_view advice = kLookAtDrivers);
 

@@ -1,4 +1,4 @@
-// Report channels and their values for people.
+// Shows report channels and their values to people.
 #pragma once
 
 #include <cstddef>
@@ -9,7 +9,7 @@
 
 namespace tavrel {
 
-/// A tree by driver, group and subgroup, or with `flat` a table of one line a channel.
+/// A tree by driver, group and subgroup, or with `flat` a table with one line per channel.
 void printChannels(std::ostream& out, const plist::Dictionary& channels, bool flat,
                    std::optional<std::size_t> columns);
 

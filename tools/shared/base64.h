@@ -12,7 +12,7 @@ namespace tavrel {
 
 std::string base64Text(ByteSpan bytes);
 
-/// Blanks and line ends are passed over. Nothing for any other text that is no base64.
+/// Ignores blanks and line ends. Nothing when the rest is not base64.
 std::optional<std::vector<std::byte>> parseBase64(std::string_view text);
 
 }  // namespace tavrel

@@ -1,12 +1,12 @@
-// Subcommands and their options, over CLI11, whose headers only command.cc and tavrelctl.cc read.
+// Subcommands and their options, over CLI11; only command.cc and tavrelctl.cc include its headers.
 //
 //   const Command group = top.addGroup("log", "Show submitted logs") const;
 //   const Command list = group.addCommand("list", "List the pending logs") const;
 //   list.addOption("--day", arguments->day, "Only those of one day").typeName("DAY") const;
 //   list.onRun([&context, arguments] { ... });
 //
-// Both classes are handles: a copy names the same command or option. What options are bound to must
-// live until the command line was parsed.
+// Both classes are handles: a copy names the same command or option. The targets of options must
+// live until the command line has been parsed.
 #pragma once
 
 #include <functional>
@@ -25,12 +25,12 @@ class Option {
   explicit Option(CLI::Option& option) : option_(&option) {}
 
   Option required() const;
-  /// What the help calls the value, such as "DAY".
+  /// The name of the value in the help, such as "DAY".
   Option typeName(const char* name) const;
-  /// The help shows the value that the target has now.
+  /// Shows the target's current value in the help.
   Option showDefault() const;
   Option oneOf(std::initializer_list<std::string> values) const;
-  /// `fault` says what is wrong with the text of a value, nothing when it can be used.
+  /// `fault` says what is wrong with the text of a value; empty when nothing is.
   Option check(std::function<std::string(const std::string& text)> fault) const;
   Option excludes(const Option& other) const;
   Option excludes(const char* otherName) const;
@@ -44,13 +44,13 @@ class Command {
   explicit Command(CLI::App& app) : app_(&app) {}
 
   Command addCommand(const char* name, const char* description) const;
-  /// A command that only has subcommands; one of them must be given.
+  /// A command that has only subcommands, one of which is required.
   Command addGroup(const char* name, const char* description) const;
   /// Options under a heading of their own, of which at most one may be given.
   Command addChoice(const char* heading) const;
 
-  /// "-v,--verbose" is an option, "FILE" an argument. Targets: std::string, double, 32-bit unsigned
-  /// integers, also optional ones, and std::vector<std::string> for repeated arguments.
+  /// "-v,--verbose" is an option, "FILE" an argument. Targets: std::string, double and 32-bit
+  /// unsigned integers, also optional ones, and std::vector<std::string> for repeated arguments.
   template <class Target>
   Option addOption(const char* names, Target& target, const char* description) const;
   Option addFlag(const char* names, bool& target, const char* description) const;

@@ -32,7 +32,7 @@ struct DistributionView {
   std::optional<double> standardDeviation() const;
 };
 
-/// One line a bucket: label, count, and a bar in proportion to the largest count.
+/// One line per bucket: label, count, and a bar in proportion to the largest count.
 void printBuckets(std::ostream& out, std::span<const DistributionView::Bucket> buckets,
                   std::optional<std::size_t> columns);
 
@@ -40,7 +40,7 @@ void printBuckets(std::ostream& out, std::span<const DistributionView::Bucket> b
 /// count.
 bool isSummary(const plist::Value& entry);
 
-/// The distributions of a log, ordered by key. Entries that are no summary are passed over.
+/// The distributions of a log, ordered by key. Entries that are not a summary are skipped.
 std::vector<DistributionView> distributionsOf(const plist::Dictionary& log);
 
 }  // namespace tavrel

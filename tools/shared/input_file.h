@@ -11,7 +11,7 @@
 
 namespace tavrel {
 
-/// The content of a file of this machine, "-" being standard input. At most `largest` bytes.
+/// The content of a file of this machine, or of standard input for "-". At most `largest` bytes.
 Expected<std::string> readInput(ToolContext& context, const std::string& file, std::size_t largest);
 
 /// A property list of either encoding, or JSON (tools/shared/json_value.h), recognised by content.

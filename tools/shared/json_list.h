@@ -1,4 +1,5 @@
-// A JSON object whose last member is a list, printed element by element: long lists need no memory.
+// A JSON object whose last member is a list, printed element by element, so that long lists need no
+// memory.
 //
 //   JsonList list(context.out(), {{"sample", 1}}, "channels");
 //   for (...) list.add({{"name", ...}});
@@ -18,13 +19,13 @@ class JsonList {
   /// Indented like other documents, or a single line.
   enum class Layout : std::uint8_t { Document, Line };
 
-  /// Prints the members of `head`, led by "format_version", and begins the list `name`.
+  /// Prints "format_version" and the members of `head`, and begins the list `name`.
   JsonList(std::ostream& out, Json head, std::string_view name, Layout layout = Layout::Document);
 
   void add(const Json& element);
-  /// An element that is JSON already and has no line ends; it is printed as it is.
+  /// An element that is already JSON without line ends; printed unchanged.
   void addText(std::string_view json);
-  /// Ends the list, the object and its line.
+  /// Ends the list, the object and the line.
   void end();
 
  private:

@@ -1,5 +1,5 @@
-// The device's platform for commands that ask its drivers: what the system's own operations print
-// becomes notes of the tool.
+// The device's platform for commands that use its drivers: the tool's notes show what the system's
+// own operations print.
 //
 //   NotingPlatform noting(context);
 //   const plist::Dictionary info = CopyNANDInfo(noting.platform());
@@ -14,7 +14,7 @@
 
 namespace tavrel {
 
-/// Both standard streams as notes, so that no output of the tool is mixed with them. Each text is a
+/// Both standard streams as notes, so that they do not mix with the tool's output. Each text is a
 /// message of its own, with or without a line end.
 class NotingStreams final : public StandardStreams {
  public:
@@ -36,7 +36,7 @@ class NotingPlatform {
   NotingPlatform& operator=(const NotingPlatform&) = delete;
 
   Platform& platform() { return platform_; }
-  /// Whether the system has said that something is wrong.
+  /// Whether the system has reported an error.
   bool hasErrors() const { return context_.hasComplaints(); }
   /// Whether the system's own operations have printed anything.
   bool hasPrinted() const { return streams_.hasPrinted(); }

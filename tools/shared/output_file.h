@@ -1,4 +1,4 @@
-// Files that a command line asks to write.
+// Files that a command line names for output.
 #pragma once
 
 #include <string>
@@ -10,7 +10,7 @@
 namespace tavrel {
 
 /// Makes `bytes` the content of a file of this machine, in one step; "-" is standard output. The
-/// folder must exist, and what is no regular file is refused.
+/// folder must exist; refuses anything but a regular file.
 Status writeOutput(ToolContext& context, const std::string& file, std::string_view bytes);
 
 }  // namespace tavrel

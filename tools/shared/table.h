@@ -11,11 +11,11 @@
 
 namespace tavrel {
 
-/// `text` on one line and harmless to a terminal: control characters and malformed bytes are
-/// written as escapes (\n, \t, \x1b).
+/// `text` on one line and harmless to a terminal: control characters and malformed bytes become
+/// escapes (\n, \t, \x1b).
 std::string printable(std::string_view text);
 
-/// Columns that `text` takes on a terminal: one for each code point.
+/// The columns of `text` on a terminal: one per code point.
 std::size_t displayWidth(std::string_view text);
 
 /// A bar of `value` out of `largest` in at most `width` columns; at least one mark unless 0.
@@ -33,7 +33,7 @@ class Table {
     Align align = Align::Left;
   };
 
-  /// `indent` blanks stand before each row.
+  /// Each row begins with `indent` blanks.
   explicit Table(std::vector<Column> columns, std::size_t indent = 0);
 
   /// Missing cells are empty; surplus ones are dropped.
@@ -41,8 +41,8 @@ class Table {
   bool empty() const { return rows_.empty(); }
 
   /// With `columns`, the width of a terminal, the widest column of left-aligned text is cut ("…")
-  /// as far as needed to fit; without, cells are whole, and long ones push the rest of their row
-  /// aside. Titles that are all empty are not printed.
+  /// as far as needed to fit; without it, cells are whole, and long ones shift the rest of their
+  /// row. Titles are not printed when all are empty.
   void print(std::ostream& out, std::optional<std::size_t> columns) const;
 
  private:

@@ -1,4 +1,4 @@
-// What every subcommand of tavrelctl is given: the device, the streams, and how to end.
+// What each subcommand of tavrelctl gets: the device, the streams, and ways to end.
 //
 // A group of subcommands registers itself with `void addXxxCommands(Command app, ToolContext&)`:
 //
@@ -37,24 +37,24 @@ struct Platform;
 using Json = nlohmann::ordered_json;
 
 /// The version of the JSON forms that the tool prints. It grows when a member changes its meaning
-/// or goes away; new members do not change it.
+/// or is removed; new members do not change it.
 inline constexpr int kJsonFormatVersion = 1;
 
-/// `object` led by the member "format_version".
+/// `object` with "format_version" as its first member.
 Json withFormatVersion(Json object);
-/// `value` as text, indented by so many spaces, or on one line for -1. Text in it that is no UTF-8
-/// is repaired.
+/// `value` as text, indented by so many spaces, or on one line for -1. Malformed UTF-8 in it is
+/// repaired.
 std::string jsonText(const Json& value, int indent);
 
 enum ExitStatus : int { kExitSuccess = 0, kExitFailure = 1, kExitUsage = 2 };
 
-/// Standard streams, and what is known of the terminal behind them.
+/// Standard streams, and the properties of their terminal.
 struct ToolStreams {
   std::istream& in;
   std::ostream& out;
   std::ostream& error;
-  /// Columns of the terminal that `out` writes to; nothing when it is none, and lines are then
-  /// never cut.
+  /// Columns of the terminal to which `out` writes; nothing when it is not a terminal, and lines
+  /// are then never cut.
   std::optional<std::size_t> columns = std::nullopt;
   bool errorIsTerminal = false;
 };
@@ -68,15 +68,15 @@ class ToolContext {
 
   // -- The device --------------------------------------------------------------------------------
 
-  /// The folder that `--root` names, else the one of the environment, else "/". Throws
-  /// std::runtime_error when there is no such folder; `runTavrelctl` makes a failure of it.
+  /// The folder that `--root` names, otherwise the one of the environment, otherwise "/". Throws
+  /// std::runtime_error when the folder does not exist; `runTavrelctl` turns that into a failure.
   const DeviceRoot& root();
-  /// Built at the first call over `root()`; include platform/linux/linux_platform.h to use it.
-  /// What its services would log appears as notes.
+  /// Built over `root()` on the first call; include platform/linux/linux_platform.h to use it. Log
+  /// lines of its services appear as notes.
   LinuxPlatform& linuxPlatform();
   Platform& platform();
   FilePreferences& preferences();
-  /// The device's store, to be read only: a damaged one stays where it is for the next run.
+  /// The device's store, for reading only: a damaged one stays in place for the next run.
   SqliteStore& storeForReading();
   /// Whether a service of the device has logged an error.
   bool hasComplaints() const { return hasComplaints_; }
@@ -90,7 +90,7 @@ class ToolContext {
   std::ostream& error() { return streams_.error; }
   /// Nothing in a pipe.
   std::optional<std::size_t> columns() const { return streams_.columns; }
-  /// Whether progress of long work is to be shown, on `error()`.
+  /// Whether to show progress of long work, on `error()`.
   bool showsProgress() const { return streams_.errorIsTerminal; }
 
   // -- JSON --------------------------------------------------------------------------------------
@@ -98,7 +98,7 @@ class ToolContext {
   /// Adds `--json` to a subcommand that prints data.
   void addJsonOption(Command command);
   bool json() const { return json_; }
-  /// Prints `object` as an indented document, led by the member "format_version".
+  /// Prints `object` as an indented document that begins with the member "format_version".
   void printJson(Json object);
 
   // -- Ends --------------------------------------------------------------------------------------

@@ -1,4 +1,4 @@
-// Property-list values as a command line gives them: a text and the kind that it is meant to be.
+// Property-list values from a command line: a text and its intended kind.
 #pragma once
 
 #include <cstdint>
@@ -14,9 +14,9 @@ enum class ArgumentKind : std::uint8_t { Text, Boolean, Integer, Real, Date };
 /// The error says what is expected.
 Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind);
 
-/// Whether XML gives the text back: UTF-8 without control characters but tabs and line ends.
+/// Whether XML can hold the text: UTF-8 without control characters except tabs and line ends.
 bool isXmlText(std::string_view text);
-/// Whether that is so of all texts and keys in `value`.
+/// Whether XML can hold all texts and keys in `value`.
 bool hasXmlTextsOnly(const plist::Value& value);
 
 }  // namespace tavrel

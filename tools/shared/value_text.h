@@ -1,4 +1,4 @@
-// Property-list values for people.
+// Shows property-list values to people.
 #pragma once
 
 #include <cstddef>
@@ -13,10 +13,10 @@ namespace tavrel {
 /// "boolean", "integer", "real", "date", "string", "data", "array" or "dictionary".
 std::string_view kindName(const plist::Value& value);
 
-/// The same with its article, for messages: "an integer".
+/// The same with an article, for messages: "an integer".
 std::string kindWithArticle(const plist::Value& value);
 
-/// A value on one line whose kind can be seen: true, 12, 2.0, "text", 2026-11-16 18:02:18 +0000,
+/// A value on one line that shows its kind: true, 12, 2.0, "text", 2026-11-16 18:02:18 +0000,
 /// <0102>, [1, {"key": 2}] with sorted keys.
 std::string inlineText(const plist::Value& value);
 

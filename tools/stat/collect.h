@@ -1,4 +1,4 @@
-// Samples of this machine, as statistics.
+// Samples this machine into statistics.
 #pragma once
 
 #include <cstdint>
@@ -8,9 +8,8 @@
 
 namespace tavrel {
 
-/// Reads the machine now and once a second for `seconds`, and keeps what it read in the statistics
-/// of the day of each reading. Readings are kept once a minute and at the end,
-/// which SIGINT and SIGTERM bring about early.
+/// Reads the machine now and once a second for `seconds`, for the statistics of the day of each
+/// reading. Writes the readings once a minute and at the end; SIGINT and SIGTERM end it early.
 void collectStatistics(ToolContext& context, std::uint32_t seconds);
 
 /// The keys that are recorded, with their units, for people.

@@ -1,6 +1,6 @@
-// What the kernel tells of the machine in /proc and /sys, read once.
+// The state of the machine in /proc and /sys, read once.
 //
-// Every figure that could not be read is nothing, never 0.
+// A figure that could not be read is nothing, never 0.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +11,7 @@
 
 namespace tavrel {
 
-/// Counters count since the machine started; a device that goes takes its part with it.
+/// Counters count since the machine started; a removed device takes its part with it.
 struct MachineReading {
   std::optional<double> uptimeSeconds;
   std::optional<double> loadOfOneMinute;
@@ -29,13 +29,13 @@ struct MachineReading {
   std::optional<std::uint64_t> memoryAvailableKib;
   std::optional<std::uint64_t> swapUsedKib;
 
-  /// Bytes over all network interfaces but the loopback.
+  /// Bytes over all network interfaces except the loopback.
   struct Traffic {
     std::uint64_t in;
     std::uint64_t out;
   };
   std::optional<Traffic> network;
-  /// Bytes of all disks with a device of their own: not of loop devices, mappings and memory.
+  /// Bytes of all disks with a device of their own, without loop devices, mappings and memory.
   std::optional<Traffic> disk;
 
   /// The hottest thermal zone.
@@ -46,7 +46,7 @@ struct MachineReading {
   std::optional<std::uint64_t> diskFreeMib;
 };
 
-/// Files below the root stand in for the machine's own.
+/// Files below the root take the place of the machine's own.
 MachineReading readMachine(const DeviceRoot& root);
 
 /// Ticks per second in which the kernel counts CPU time.

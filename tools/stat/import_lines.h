@@ -1,10 +1,10 @@
-// The text form in which statistics are imported and exported, one row a line:
+// The text form in which statistics are imported and exported, one row per line:
 //
 //   scalar<TAB>DAY<TAB>KEY<TAB>INTEGER
 //   value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE
 //
-// A day is a number of days since 1970-01-01 or YYYY-MM-DD; a key is UTF-8 without tabs and line
-// ends; SECONDS is the offset within the day; doubles are those of tools/stat/import_number.h.
+// A day is the number of days since 1970-01-01 or YYYY-MM-DD; a key is UTF-8 without tabs or line
+// ends; SECONDS is the offset within the day; tools/stat/import_number.h has the form of doubles.
 #pragma once
 
 #include <cstdint>
@@ -40,7 +40,7 @@ class ImportParser {
   /// Takes the last line when the stream does not end with a line end.
   Status finish(const Sink& sink);
 
-  /// Lines taken so far, the one that was stopped at included.
+  /// Lines taken so far, including the one at which it stopped.
   std::uint64_t lines() const { return lines_; }
 
  private:

@@ -1,8 +1,9 @@
-// Doubles as text without the loss of a bit.
+// Doubles as text, without losing a bit.
 //
-// Every form that the C library's strtod reads is read: decimal, hexadecimal, "inf", "nan", with a
-// sign or without. A not-a-number may carry its bits: "nan(0x1)" is the quiet one with payload 1,
-// and a number from 2^51 up gives all bits but the sign, so that signalling ones have a text too.
+// Reads all forms that the C library's strtod reads: decimal, hexadecimal, "inf", "nan", with a
+// sign or without. A not-a-number may have its bits: "nan(0x1)" is the quiet one with payload 1,
+// and a number from 2^51 up gives all bits except the sign, so that signalling ones have a text
+// too.
 #pragma once
 
 #include <string>

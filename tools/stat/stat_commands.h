@@ -1,4 +1,4 @@
-// tavrelctl stat: the statistics that are kept, and keeping some.
+// tavrelctl stat: shows and records statistics.
 #pragma once
 
 #include "tools/shared/tool_context.h"

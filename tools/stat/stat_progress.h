@@ -1,4 +1,4 @@
-// How far long work has come, on a terminal; nothing in a pipe.
+// Shows the progress of long work on a terminal, and nothing in a pipe.
 #pragma once
 
 #include <chrono>
@@ -10,7 +10,7 @@
 
 namespace tavrel {
 
-/// One line that is written over, at most four times a second, and taken away at the end.
+/// One line that is overwritten at most four times a second and removed at the end.
 class StatProgress {
  public:
   /// The context must outlive it.
@@ -20,7 +20,7 @@ class StatProgress {
   StatProgress& operator=(const StatProgress&) = delete;
 
   void show(std::string_view text);
-  /// "WHAT: COUNT rows", for loops too fast to look at the clock each time round.
+  /// "WHAT: COUNT rows", for loops too fast to read the clock in each round.
   void count(std::string_view what, std::uint64_t count) {
     if (count % kRowsBetweenLooks == 0 && context_.showsProgress()) showCount(what, count);
   }

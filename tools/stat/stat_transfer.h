@@ -1,4 +1,4 @@
-// Statistics into the store and out of it, in the form of tools/stat/import_lines.h.
+// Imports and exports statistics in the form of tools/stat/import_lines.h.
 #pragma once
 
 #include <cstdint>
@@ -9,12 +9,12 @@
 
 namespace tavrel {
 
-/// Imports a file, "-" being standard input, as one transaction: a bad line stops it, and nothing
-/// of the file is kept. Values are appended to what a distribution already has; scalars replace.
+/// Imports a file, or standard input for "-", as one transaction: a bad line ends it, and nothing
+/// of the file is kept. Values are appended to a distribution; scalars replace earlier ones.
 void importStatistics(ToolContext& context, const std::string& file);
 
-/// Writes what is held of the keys that begin with `prefix`, of one day or of all. Keys that the
-/// form cannot hold are named and make the command fail.
+/// Writes the rows whose keys begin with `prefix`, of one day or of all. Names keys that the form
+/// cannot hold, and then fails.
 void exportStatistics(ToolContext& context, const std::string& prefix,
                       std::optional<std::int32_t> day);
 

@@ -1,4 +1,4 @@
-// What in a whitelist would not do what its author may think.
+// Finds what in a whitelist would not do what its author may expect.
 #pragma once
 
 #include <string>
@@ -8,15 +8,15 @@
 
 namespace tavrel {
 
-/// What is wrong at one place of the whitelist.
+/// A fault at one place of the whitelist.
 struct WhitelistFinding {
   std::string path;  // "Group/ScalarKeys/key/sig_fig"; empty for the whole file
   std::string message;
 };
 
-/// Everything that the daemon would ignore or that has a wrong type, then keys in more than one
-/// group and prefixes that hide others. At most `limits::kWhitelistFindings`, and one that counts
-/// the rest.
+/// Everything that the daemon would ignore or that has a wrong type, then keys in several groups
+/// and prefixes that hide others. At most `limits::kWhitelistFindings`, and one that counts the
+/// rest.
 std::vector<WhitelistFinding> checkWhitelist(const plist::Value& whitelist);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// What the whitelist decides on keys, and why.
+// What the whitelist decides about keys, and why.
 #pragma once
 
 #include <cstdint>
@@ -15,7 +15,7 @@
 
 namespace tavrel {
 
-/// A value to show the coarsening of: as a scalar when it is a 64-bit integer, and as a value of a
+/// A value whose coarsening to show: as a scalar when it is a 64-bit integer, and as a value of a
 /// distribution.
 struct ExampleValue {
   std::optional<std::int64_t> scalar;
@@ -30,7 +30,7 @@ struct KindExplanation {
   std::string prefix;
   /// As the daemon finds them; an empty handle when the key is not reported.
   plist::Dictionary options;
-  /// The group whose rule would decide if it were loaded, and why it is not.
+  /// The group whose rule would decide if it were loaded, and why it is not loaded.
   std::string idleGroup;
   std::string idleReason;
 };
@@ -44,8 +44,8 @@ struct KeyExplanation {
   std::optional<std::string> bucket;  // label of the example's histogram bucket
 };
 
-/// Asks the daemon's own configuration, made from `bytes`, and finds the rules in `whitelist`, the
-/// value of the same bytes.
+/// Queries the daemon's own configuration, made from `bytes`, and finds the rules in `whitelist`,
+/// the value of the same bytes.
 Expected<std::vector<KeyExplanation>> explainKeys(LinuxPlatform& device, const std::string& bytes,
                                                   const plist::Value& whitelist,
                                                   const std::vector<std::string>& keys,

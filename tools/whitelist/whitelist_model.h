@@ -1,7 +1,7 @@
-// The whitelist as its author wrote it: every rule with the group and table that it stands in.
+// The whitelist as its author wrote it: each rule with its group and table.
 //
-// The daemon keeps only the union of the groups; this model keeps where each rule came from, so
-// that the tool can say which one decides and which are without effect.
+// The daemon keeps only the union of the groups; this model keeps the origin of each rule, so that
+// the tool can say which one decides and which have no effect.
 //
 //   const WhitelistModel model(*decoded);
 //   const WhitelistDecisions decisions(model, isInternal, isLoaded);
@@ -20,7 +20,7 @@
 
 namespace tavrel {
 
-/// Where a rule stands, in the order of `kWhitelistTables`.
+/// The table of a rule, in the order of `kWhitelistTables`.
 enum class WhitelistTable : std::uint8_t {
   ScalarKeys,
   ScalarPrefixes,
@@ -46,7 +46,7 @@ struct WhitelistRule {
 
 class WhitelistModel {
  public:
-  /// Rules that would not be loaded for their type are left out.
+  /// Leaves out rules whose type prevents loading.
   explicit WhitelistModel(plist::Value whitelist);
 
   /// The rules of a table in the order in which the daemon loads them.
@@ -59,7 +59,7 @@ class WhitelistModel {
   std::array<std::vector<WhitelistRule>, kWhitelistTables.size()> rules_;
 };
 
-/// How the whitelist decides on one key.
+/// How the whitelist decides about one key.
 struct WhitelistDecision {
   enum class Rule : std::uint8_t { None, Exact, Prefix, Internal };
   Rule rule = Rule::None;
@@ -71,7 +71,7 @@ struct WhitelistDecision {
 /// must outlive it.
 class WhitelistDecisions {
  public:
-  /// `isLoaded` tells whether the daemon loads a group of this name.
+  /// `isLoaded` says whether the daemon loads a group of this name.
   template <class IsLoaded>
   WhitelistDecisions(const WhitelistModel& model, bool isInternalDevice, IsLoaded isLoaded)
       : isInternalDevice_(isInternalDevice) {
