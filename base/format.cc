@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// What is done with a width or precision beyond the limit that an argument gives.
+// What to do with a width or precision from an argument that exceeds the limit.
 enum class Excess { Clamp, Refuse };
 
 // The longest text of a double: 309 digits before the point, the point, and the decimals.
@@ -43,7 +43,7 @@ void appendPadded(std::string& out, const Directive& directive, std::string_view
   if (directive.leftAlign) out.append(padding, ' ');
 }
 
-// The sign and the base ("0x") of a number, which stand before the zeros that fill it up.
+// The sign and the base ("0x") of a number, which precede the zeros that pad it.
 class Prefix {
  public:
   void append(char c) { text_[length_++] = c; }
@@ -297,7 +297,7 @@ class Engine {
     return static_cast<std::int32_t>(std::get<std::uint32_t>(argument->value()));
   }
 
-  // Brings a width or precision that an argument gave within the limit, or fails.
+  // Limits a width or precision from an argument, or fails.
   bool limit(std::int64_t& size) {
     if (size <= limits::kLargestFormatWidth) return true;
     if (excess_ == Excess::Refuse) {
@@ -326,7 +326,7 @@ class Engine {
     if (!star) return false;
     if (*star < 0) return true;
     std::int64_t precision = *star;
-    // That of a text only shortens it: a literal of ours may give any.
+    // The precision of a text only shortens it, so a literal of ours may give any.
     const bool shortens = directive.conversion == 's' || directive.conversion == '@';
     if (!(shortens && excess_ == Excess::Clamp) && !limit(precision)) return false;
     directive.precision = static_cast<std::int32_t>(precision);

@@ -15,7 +15,7 @@ using plist::Kind;
 // Up to here every integer is a double, so that its digits read back to it.
 constexpr double kLargestPlainInteger = 9007199254740992.0;
 
-// Dates beyond have no 64-bit year that the calendar arithmetic is good for.
+// The calendar arithmetic does not cover dates beyond.
 constexpr double kLargestSeconds = 3e16;
 
 template <class Integer>

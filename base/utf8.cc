@@ -10,7 +10,7 @@ bool isSurrogate(char32_t codePoint) {
 }
 
 // The code point at the front of `text` and the length of its sequence; kMalformed with length 1
-// for a byte that begins no well-formed sequence.
+// for a byte that does not begin a well-formed sequence.
 struct Decoded {
   char32_t codePoint;
   std::size_t length;

@@ -24,8 +24,8 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
   build();
 }
 
-// Ranges still to be built are kept on a list of their own: how deep prefixes nest is the file's
-// choice and must not decide how deep the machine's stack goes.
+// Ranges still to be built wait on a list of their own: the file decides how deep prefixes nest,
+// and that must not decide the depth of the machine's stack.
 void PrefixTree::build() {
   struct Range {
     std::size_t node, begin, end;
@@ -59,7 +59,7 @@ void PrefixTree::build() {
   }
 }
 
-// The root, which is nobody's child, stands for none.
+// The root is not a child, so its number means no child.
 std::size_t PrefixTree::childFor(const Node& node, char next) const {
   if (node.childCount == 0) return 0;
   const char* branches = branches_.data() + node.firstChild;
@@ -70,7 +70,7 @@ std::size_t PrefixTree::childFor(const Node& node, char next) const {
 
 std::optional<std::string_view> PrefixTree::longestMatch(std::string_view key) const {
   if (nodes_.empty()) return std::nullopt;
-  // The branches alone lead to the only node of which the key can begin with the most.
+  // The branches alone lead to the node that shares the longest beginning with the key.
   const Node* node = nodes_.data();
   while (node->length < key.size()) {
     const std::size_t child = childFor(*node, key[node->length]);

@@ -56,7 +56,7 @@ void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo, const Ste
   }
   dailyTasksForDay(platform, yesterday, appInfo, onStep);
   beginStep(onStep, "End of the gated run");
-  // What the tasks have set must not be lost to a kill once the day counts as done.
+  // A kill must not lose what the tasks have set once the day counts as done.
   runGuarded(platform.log, "checkpoint the store after the tasks",
              [&] { platform.statistics->BHClientCheckpoint(); });
   platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);

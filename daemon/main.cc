@@ -11,8 +11,8 @@
 
 namespace {
 
-/// A reader of standard error that has gone must not end the run, and a log line must not go into a
-/// data file that was given the number of a standard stream which was closed at the start.
+/// The run must go on when the reader of standard error has gone. A log line must not end up in a
+/// data file that got the number of a standard stream closed at the start.
 void secureStandardStreams() {
   std::signal(SIGPIPE, SIG_IGN);
   int descriptor = 0;
@@ -23,7 +23,7 @@ void secureStandardStreams() {
 
 }  // namespace
 
-// The exit status is 0 whatever happened: nobody restarts the daemon, the next day does.
+// The exit status is always 0: a failed run is not restarted, the next day runs again.
 int main(int argc, char** argv) {
   using namespace tavrel;
   secureStandardStreams();

@@ -108,7 +108,8 @@ class Tracker {
     return platform_.preferences->ZTXPreferencesGetValue(key, kTavrelDomain);
   }
 
-  /// Says so when it cannot. Settings that are applied and not remembered could never be undone.
+  /// Logs an error when it cannot. Settings that are applied and not remembered could never be
+  /// undone.
   bool canBeRemembered(const plist::Dictionary& scheduled) {
     if (!scheduled.array(kTaskingPayloadKey)) return true;  // nothing is
     auto kept = plist::Dictionary::create();

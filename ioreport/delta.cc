@@ -11,10 +11,10 @@
 namespace tavrel {
 namespace {
 
-// What computing a delta fails with when values are missing.
+// The error of a delta when values are missing.
 constexpr KernelReturn kMissingValues = 1;
 
-/// The elements of one channel in both samples, and where their difference goes.
+/// The elements of one channel in both samples, and the place for their difference.
 struct Triple {
   Elements previous;
   Elements current;
@@ -37,7 +37,7 @@ bool subtractState(const Triple& states, std::size_t i) {
   return true;
 }
 
-// The sum of a bucket that took no values since says nothing. Before its first value it is not set.
+// The sum of a bucket without new values means nothing, and it is unset before the first value.
 bool subtractBucket(const Triple& buckets, std::size_t i) {
   if (buckets.isInvalid(i, kBucketHits)) return false;
   const std::int64_t hits = buckets.difference(i, kBucketHits);

@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// Of an id that stands in the place of a channel's name.
+// For an id in place of a channel's name.
 constexpr std::size_t kChannelIDCharacters = 9;
 
 std::string_view upToZeroByte(std::string_view text) {

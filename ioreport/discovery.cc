@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// The value when it is a text, else null.
+// The value when it is a text, otherwise null.
 plist::Value textUnder(const plist::Dictionary& entry, std::string_view key) {
   plist::Value value = entry.get(key);
   return value.string() ? value : plist::Value();

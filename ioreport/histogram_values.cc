@@ -40,7 +40,7 @@ plist::Array bucketBounds(ByteSpan configuration, std::size_t largestCount) {
   return bounds;
 }
 
-// The bounds of a channel, which keeps them once they are worked out.
+// The bounds of a channel, which caches them once they are computed.
 plist::Array processedBounds(plist::Dictionary channel) {
   const std::int32_t count = IOReportHistogramGetBucketCount(channel);
   if (!channel.contains(kProcessedConfigKey) && count >= 0) {

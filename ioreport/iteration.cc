@@ -19,7 +19,7 @@ IterateResult combined(IterateResult earlier, IterateResult next) {
   return walkFailed(next) ? next : earlier | next;
 }
 
-// An empty handle for what is no channel.
+// An empty handle for anything but a channel.
 plist::Dictionary channelAt(const plist::Array& channels, std::size_t index) {
   return index < channels.size() ? channels.begin()[index].dictionary() : plist::Dictionary();
 }
@@ -32,8 +32,8 @@ plist::Dictionary copyOfChannel(const plist::Dictionary& channel) {
   return copy;
 }
 
-/// An iterate walk that only counts. It does not look into the channels, which in large aggregates
-/// are far apart in memory.
+/// An iterate walk that only counts. It does not read the channels, which in large aggregates are
+/// far apart in memory.
 struct CountWalk {
   std::int32_t& count;
 };
@@ -49,8 +49,8 @@ IterateResult walkChannels(const CountWalk& walk, const plist::Array& channels, 
   return kIterateContinue;
 }
 
-// A callback sees the channels that the array has when the walk comes to it, not those that it
-// files there itself.
+// The walk visits the channels that the array has when it arrives, not those that callbacks add to
+// it.
 IterateResult walkChannels(const IterateWalk& walk, const plist::Array& channels,
                            const plist::Array&, plist::Array&) {
   IterateResult result = kIterateContinue;
@@ -189,7 +189,7 @@ class Engine {
     return result;
   }
 
-  // The entries are noted down first: who is called back may file channels of new names.
+  // The entries are listed first, because a callback may file channels under new names.
   IterateResult walkContainer(std::string_view key, plist::Dictionary& level,
                               const plist::Dictionary& other, plist::Dictionary& built,
                               std::size_t depth) const {

@@ -75,7 +75,7 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
     }
   }
 
-  // A summary of some of the values would pass for one of all of them.
+  // A summary of some values would look like one of all of them.
   if (values.failed()) return;
 
   if (histogram) {

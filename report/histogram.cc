@@ -12,7 +12,7 @@ namespace {
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
 constexpr double kNotANumber = std::numeric_limits<double>::quiet_NaN();
 
-// A boundary that is no number stops no value.
+// A boundary that is not a number stops no value.
 double boundaryOf(const plist::Value& value) {
   const auto number = value.number();
   return number ? number->real() : kNotANumber;
@@ -69,8 +69,8 @@ std::optional<Histogram> Histogram::create(const plist::Array& intervals) {
   return histogram;
 }
 
-// Halving without branches: values come in no order that a CPU could predict. The comparisons are
-// written so that not-a-number passes every boundary.
+// Halving without branches: a CPU cannot predict the order of values. The comparisons are written
+// so that not-a-number passes every boundary.
 std::uint32_t Histogram::bucketOf(double value) const {
   const double* first = ends_.data();
   std::size_t count = ends_.size();

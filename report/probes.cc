@@ -24,7 +24,7 @@ constexpr const char* kHomeDirectory = "/var/mobile";
 constexpr std::int64_t kBytesPerMiB = 1048576;
 
 /// A scalar that is read from a system control: its name, how long its value is in bytes (the
-/// number reported stands in the first eight), and what is reported when it cannot be read.
+/// reported number is in the first eight), and the value reported when it cannot be read.
 struct VMControl {
   std::string_view key;
   std::string_view control;
@@ -50,7 +50,7 @@ std::int64_t readControl(SystemControls& controls, const VMControl& control) {
   std::array<std::byte, 32> buffer{};
   const MutableByteSpan value = MutableByteSpan(buffer).first(control.length);
   if (controls.read(control.control, value).errorNumber != 0) return control.failure;
-  // A value of four bytes is followed by zeros, which extend it.
+  // The zeros after a value of four bytes extend it.
   return static_cast<std::int64_t>(*loadLittle64(buffer, 0));
 }
 
@@ -93,8 +93,8 @@ void BHReport::reportDatabaseSize() {
   addScalarForKey(kCorruptionsKey, [this] { return takeCorruptionCount(); });
 }
 
-// Reads the count and starts it anew. The preference is written back by whoever next synchronises
-// its domain, at the latest at the end of the process.
+// Reads and resets the count. The next synchronisation of its domain writes the preference back, at
+// the latest at the end of the process.
 std::int64_t BHReport::takeCorruptionCount() {
   if (!findFaultlinePreferences(platform_)) return 0;
   const ProcessState& state = platform_.state;

@@ -11,7 +11,7 @@ constexpr std::string_view kInternalDiagnosticsIdentifier = "com.norvane.zentrix
 
 constexpr std::int32_t kLogVersion = 1;
 
-// The text before the first NUL of `bytes`, or nothing when it is no UTF-8.
+// The text before the first NUL of `bytes`, or nothing when it is not UTF-8.
 std::optional<std::string_view> terminatedText(ByteSpan bytes) {
   const std::string_view text = asText(bytes);
   const std::string_view terminated = text.substr(0, text.find('\0'));

@@ -45,7 +45,7 @@ void copyRange(CounterBlock block, TelemetryCounters& record) {
   }
 }
 
-// The ranges are constants of the copying code: a block is copied without a look at a table.
+// The ranges are constants of the copying code, which needs no table at run time.
 template <const auto& kMap>
 void copyCounters(CounterBlock block, TelemetryCounters& record) {
   static_assert(isSound(kMap));

@@ -63,7 +63,7 @@ using ECCEventRecord = std::array<std::byte, 72>;
 
 constexpr int kMostEventsLogged = 10;
 
-/// Errors that only say that there is nothing to read now.
+/// Errors that only mean that there is nothing to read now.
 constexpr int kNoSuchEntry = 2;
 constexpr int kBusy = 16;
 
@@ -87,7 +87,7 @@ void reportECCEvents(Platform& platform) {
     platform.crashReporting->FLLogStructuredData(kEccRecordType, dictionaryOf(event));
     error = readNext();
   }
-  // Also said, with 0, when events were left over: the last one read is not logged.
+  // Also logged, with 0, when events were left over: the last one read is not logged.
   if (error != kNoSuchEntry && error != kBusy) {
     platform.log->log(LogLevel::Default, "Unexpected errno (%d) reading ECC events from kernel",
                       error);

@@ -10,12 +10,12 @@
 namespace tavrel {
 namespace {
 
-// A table that begins with this number stands for a list that the driver does not offer.
+// A table that begins with this number means that the driver does not offer the list.
 constexpr std::uint32_t kNoSelector = 0xFFFFFFFF;
 
 bool fetchOver(UserClient& client, const NandExporter& exporter, StandardStreams& streams,
                ASPContext& context) {
-  // A driver without a table is asked with no request.
+  // A driver without a table gets no request.
   const SelectorTable* table = nullptr;
   if (exporter.statistics) {
     table = exporter.statistics();

@@ -18,7 +18,7 @@ constexpr std::size_t firstSlot(std::string_view name) {
 }
 
 // Row numbers + 1 in an open-addressing table, 0 for a free slot. Of rows with one name only the
-// first is filed, which is the one that a walk from the front finds.
+// first is stored, which is the one that a walk from the front finds.
 constexpr auto kRowsBySlot = [] {
   std::array<std::uint16_t, kSlots> slots{};
   for (std::size_t row = 0; row < keyMap.size(); ++row) {

@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// Buffers of older versions carry only the first figures.
+// Buffers of older versions have only the first figures.
 constexpr std::uint32_t kFirstFullExportVersion = 0x20002;
 
 constexpr std::uint64_t kSecondsTo2000 = 946684800;  // since 1970
@@ -22,7 +22,7 @@ constexpr std::uint64_t kSecondsPerWeek = 604800;
 
 constexpr std::uint64_t kNotSeen = 0xFFFFFFFF;
 
-/// What is gathered over several statistics.
+/// Figures that combine several statistics.
 struct Figures {
   std::uint64_t userPartitionStart = kNotSeen;
   std::uint64_t intermediatePartitionStart = kNotSeen;

@@ -22,10 +22,10 @@ bool gNeedValidityList = false;
 
 namespace {
 
-/// Above this the validity list is worth its place, unless a preference says otherwise.
+/// Above this threshold the validity list is logged, unless a preference gives another one.
 constexpr double kDefaultThreshold = 2.0;
 
-/// Bytes that write amplification is counted in, as a power of two.
+/// The unit of write amplification in bytes, as a power of two.
 constexpr unsigned kUnitShift = 12;
 
 constexpr std::uint8_t kTelemetrySubLists = 3;
@@ -57,7 +57,7 @@ WriteAmplification amplificationIn(const ASPContext& context) {
   return result;
 }
 
-/// The threshold that a preference sets; nothing when it does not count.
+/// The threshold from the preference; nothing when that is absent or out of range.
 std::optional<float> preferredThreshold(Preferences& preferences) {
   const auto number =
       preferences.ZTXPreferencesGetValue("userWAmp", "com.norvane.NANDInfo").number();
@@ -100,7 +100,7 @@ struct SelectorFunction {
   std::uint8_t subList = 0;
 };
 
-/// The queries of a run. What a driver does not offer is told on standard error.
+/// The queries of a run. Lists that a driver does not offer are reported on standard error.
 class SelectorFunctions {
  public:
   SelectorFunctions(const NandExporter& exporter, StandardStreams& streams) {
@@ -131,8 +131,8 @@ class SelectorFunctions {
   std::size_t count_ = 0;
 };
 
-/// Fetches one list and has it logged. False when it could not be logged; a list that the driver
-/// does not yield does not count as that.
+/// Fetches and logs one list. False when it could not be logged; true when the driver does not
+/// yield it.
 bool logList(Platform& platform, UserClient& client, const NandExporter& exporter,
              const SelectorFunction& function, std::int32_t index, bool requestFlag,
              const plist::Value& characteristics) {
@@ -159,7 +159,7 @@ bool logList(Platform& platform, UserClient& client, const NandExporter& exporte
     streams.printError("Could not retrieve data from driver for selector %u\n", table->fetch);
     return true;
   }
-  // Whatever the driver filled in, the list is as long as it said before; the rest is 0.
+  // The list is as long as the driver said before, however much it filled in; the rest is 0.
   return function.callback(platform, buffer.bytes(), characteristics);
 }
 

@@ -25,7 +25,7 @@ constexpr std::int32_t kChipIDBytes = 64;
 constexpr const char* kChannelFields[] = {"RD",  "PE",         "Max_PE_rate", "t0",
                                           "Ret", "block_type", "num_pages"};
 
-/// What decides how a controller's telemetry is read.
+/// The characteristics that decide how to read a controller's telemetry.
 struct Controller {
   std::uint32_t generation;
   CounterParser parser;

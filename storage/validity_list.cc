@@ -11,7 +11,7 @@ namespace tavrel {
 namespace {
 
 // Header: the counts of records and of 8-byte items (32 bits each), 4 bytes that are not read. The
-// items are not read; behind them stand the records.
+// items are not read; the records follow them.
 constexpr std::uint64_t kRecordCount = 0;
 constexpr std::uint64_t kItemCount = 4;
 constexpr std::uint64_t kHeaderBytes = 12;

@@ -28,7 +28,7 @@ struct Item {
   ByteSpan payload;
 };
 
-// The first of `items`, or nothing when it is not wholly there.
+// The first of `items`, or nothing when it is truncated.
 std::optional<Item> frontItem(ByteSpan items) {
   if (items.size() < kHeaderBytes) return std::nullopt;
   const auto payload = slice(items, kHeaderBytes, *loadLittle32(items, 4));
@@ -36,11 +36,11 @@ std::optional<Item> frontItem(ByteSpan items) {
   return Item{*loadLittle32(items, 0), *loadLittle64(items, 8), *payload};
 }
 
-// What is known of a container whose end has not come yet.
+// The state of a container whose end has not been reached.
 struct Level {
   std::uint64_t identifier;
   ByteSpan statistics;   // without data when there are none
-  bool isNamed = false;  // the last thread name is the one looked for
+  bool isNamed = false;  // the last thread name is the wanted one
 };
 
 bool beginsContainer(const Item& item) {
@@ -52,7 +52,7 @@ bool ends(const Level& level, const std::optional<Item>& item) {
   return item->type == kContainerEnd && item->flags == level.identifier;
 }
 
-// Names of full length have no zero byte; then what is there must be the beginning of `name`.
+// Names of full length have no zero byte; they must be the beginning of `name`.
 bool isName(ByteSpan payload, std::string_view name) {
   const auto text = asText(payload.first(std::min(payload.size(), kLongestName)));
   const std::size_t end = text.find('\0');

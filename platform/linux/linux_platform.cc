@@ -31,7 +31,7 @@
 namespace tavrel {
 
 // Members are destroyed from the last to the first: the store commits while preferences can still
-// be set, preferences are written while the log can still tell a failure.
+// be set, and preferences are written while the log can still report a failure.
 struct LinuxPlatform::Services {
   Services(DeviceRoot folder, const LinuxPlatformOptions& given)
       : options(given), root(std::move(folder)) {}

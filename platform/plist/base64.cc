@@ -9,7 +9,7 @@ namespace {
 constexpr std::string_view kDigits =
     "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
 
-// What is no digit has a bit above the six.
+// A value with a bit above the six is not a digit.
 constexpr std::uint8_t kSpace = 0x40;
 constexpr std::uint8_t kPadding = 0x80;
 constexpr std::uint8_t kForeign = 0xC0;

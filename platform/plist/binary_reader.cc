@@ -21,7 +21,7 @@ using namespace binary;
 // Each value is one object, and at most one more is its key.
 constexpr std::size_t kLargestObjectCount = 2 * limits::kPropertyListValues;
 
-// A big-endian word of 1 to 8 bytes, which the caller knows to be there.
+// A big-endian word of 1 to 8 bytes; the caller has checked that they exist.
 std::uint64_t loadWord(const std::byte* at, std::size_t width) {
   std::uint64_t word = 0;
   for (std::size_t i = 0; i < width; ++i)
@@ -33,7 +33,7 @@ bool isAscii(std::string_view text) {
   return std::ranges::none_of(text, [](char byte) { return (byte & 0x80) != 0; });
 }
 
-// Operations answer false for a failure, and then `error_` says which.
+// Operations return false for a failure, and `error_` then says which.
 class BinaryReader {
  public:
   explicit BinaryReader(ByteSpan bytes) : bytes_(bytes) {}
@@ -255,8 +255,8 @@ bool BinaryReader::readReal(const Object& object, Value& out) {
 }
 
 // Data may be written in place, so each reference has its own, and objects may overlap: without a
-// limit a small document could ask for any amount of memory. Texts are shared, but whoever prints
-// or encodes the value has each reference to them in full.
+// limit a small document could ask for any amount of memory. Texts are shared, but printing or
+// encoding the value writes each reference in full.
 bool BinaryReader::admitBytes(std::size_t offset, std::size_t count) {
   contentBytes_ += count;
   if (contentBytes_ <= limits::kPropertyListBytes) return true;
@@ -303,7 +303,7 @@ bool BinaryReader::readKey(const Reference& reference, String& out) {
   return readText(reference, object, out);
 }
 
-// Opens a container whose references are known to be there.
+// Opens a container whose references have been checked.
 bool BinaryReader::enter(const Reference& reference, Object& object,
                          std::size_t referencesPerElement) {
   if (!readLength(object)) return false;

@@ -70,8 +70,8 @@ Word wordOf(const Number& number) {
           static_cast<std::uint8_t>(width)};
 }
 
-// Numbers the objects in the order of a walk over the values, then writes them in that order, for
-// which the width of references must be known.
+// Numbers the objects in the order of a walk over the values. Then the width of references is
+// known, and it writes the objects in that order.
 class BinaryWriter {
  public:
   Expected<std::string> write(const Value& root) {
@@ -200,7 +200,7 @@ bool BinaryWriter::numberText(std::string_view text) {
   return guard_.admitBytes(contentBytes_);
 }
 
-// Adds the object unless there is one like it already.
+// Adds the object unless there is an equal one.
 void BinaryWriter::addUnique(const Object& object) {
   if (uniqueObjects_ * 2 >= slots_.size()) growSlots();
   std::uint32_t& slot = slotFor(object);
@@ -212,7 +212,7 @@ void BinaryWriter::addUnique(const Object& object) {
   last_ = slot - 1;
 }
 
-// The slot of an object like this one, or the free one where it belongs.
+// The slot of an equal object, or the free one where it belongs.
 std::uint32_t& BinaryWriter::slotFor(const Object& object) {
   const std::size_t mask = slots_.size() - 1;
   auto at = static_cast<std::size_t>(object.hash) & mask;

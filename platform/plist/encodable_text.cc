@@ -13,7 +13,7 @@ bool isXmlCharacter(char32_t codePoint) {
   return codePoint != 0xFFFE && codePoint != 0xFFFF;
 }
 
-// True for the bytes that stand for themselves in XML text.
+// True for the bytes that need no escape in XML text.
 constexpr std::array<bool, 256> kPlain = [] {
   std::array<bool, 256> plain{};
   for (std::size_t byte = 0x20; byte < 0x80; ++byte)

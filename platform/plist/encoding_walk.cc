@@ -58,7 +58,7 @@ std::size_t SortedEntries::push(const Dictionary& dictionary) {
     encodableKeys = encodableKeys && isEncodable(entry.key, alphabet_);
   }
   const auto begin = items_.begin() + static_cast<std::ptrdiff_t>(first);
-  // What was read from a document of ours is in order already.
+  // Dictionaries from our own documents are already in order.
   if (!std::ranges::is_sorted(begin, items_.end(), {}, &Item::key)) {
     std::ranges::sort(begin, items_.end(), {}, &Item::key);
   }
@@ -79,8 +79,8 @@ void SortedEntries::repairKeys(std::size_t first) {
       lacking.push_back(&items_[i]);
     }
   }
-  // The numbers go on from the last one that the same text was given, so that many keys which
-  // become equal cost no search each.
+  // The numbers continue from the last one for the same text, so that many keys that become equal
+  // do not need a search each.
   std::map<std::string, std::size_t> lastNumbers;
   for (Item* item : lacking) {
     const std::string text = encodable(item->key, alphabet_);

@@ -66,14 +66,14 @@ std::string_view trimmed(std::string_view text) {
   return text.substr(first, text.find_last_not_of(kSpace) - first + 1);
 }
 
-// Turns Expat's events into values as they come. What a container holds is gathered on one stack,
-// so that a container is made once, with room for just its elements.
+// Turns Expat's events into values as they come. Elements of containers wait on one stack, so that
+// a container is made once, with exactly the room for its elements.
 class XmlReader {
  public:
   Expected<Value> read(ByteSpan bytes);
 
   /// Runs `action` unless the parse has failed. Nothing may be thrown through the parser, which is
-  /// C: an exception ends the parse and goes on behind it.
+  /// C: an exception ends the parse and is thrown again after it.
   template <class Action>
   void guarded(Action action) noexcept {
     if (failed_) return;

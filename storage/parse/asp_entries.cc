@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-// Room for all that a real buffer holds. Pages that no entry comes to lie in cost nothing.
+// Room for everything in a real buffer. Pages without entries cost nothing.
 constexpr std::size_t kBlockPairs = 1400;
 
 }  // namespace

@@ -19,7 +19,7 @@ std::uint64_t unitAt(ByteSpan units, std::size_t index) {
   return bytes_detail::assembleLittle<std::uint64_t>(&units[index * kUnitBytes]);
 }
 
-// The fields that other parts of the system read without a look at the lists.
+// The fields that other parts of the system read without searching the lists.
 void storeField(ASPContext& context, std::uint32_t key, std::uint64_t value) {
   const auto low = static_cast<std::uint32_t>(value);
   // clang-format off

@@ -5,7 +5,7 @@
 namespace tavrel {
 namespace {
 
-// The numbers of one place in all triples of a field.
+// The numbers at one position in all triples of a field.
 struct LatencyRun {
   const char* name;  // what the field's format is applied to
   FormatOf<std::uint32_t> first;

@@ -24,8 +24,7 @@ constexpr std::string_view kEventEnding = ".event";
 constexpr std::string_view kErrorEnding = ".errno";
 constexpr mode_t kMode = 0640;
 
-/// What is remembered beside the counters: the boot that they are of, and its number among the
-/// boots that were seen.
+/// Remembered with the counters: their boot, and its number among the boots that were seen.
 constexpr std::string_view kBootIDKey = "BootID";
 constexpr std::string_view kBootNumberKey = "BootNumber";
 
@@ -51,7 +50,7 @@ std::optional<std::uint64_t> numberIn(std::string_view text) {
   return number;
 }
 
-/// 0 for what is no error number.
+/// 0 when the text is not an error number.
 int errorNumberIn(std::string_view text) {
   const std::uint64_t number = numberIn(text).value_or(0);
   return number <= kLargestErrorNumber ? static_cast<int>(number) : 0;
@@ -98,7 +97,7 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
       continue;
     }
     if (mode_ == Mode::Consume) {
-      // An event that stays would be read again and again.
+      // An event that stayed would be read again and again.
       if (Status removed = files_.remove(path); !removed) {
         log_.write(LogLevel::Error, removed.error().message);
         return {EIO, 0};
@@ -135,7 +134,7 @@ void EccEvents::fill() {
   }
   std::stable_sort(queue_.begin(), queue_.end(),
                    [](const Event& a, const Event& b) { return a.name > b.name; });
-  // What is about to be published anew has the name of what a run that was cut off published.
+  // An event published again has the name that a run that was cut off gave it.
   const auto isSame = [](const Event& a, const Event& b) { return a.name == b.name; };
   queue_.erase(std::unique(queue_.begin(), queue_.end(), isSame), queue_.end());
 }
@@ -174,10 +173,10 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
   std::uint64_t boot = lastBoot ? static_cast<std::uint64_t>(lastBoot->int64()) : 0;
   if (!bootID.empty() && counted.string(kBootIDKey) != bootID) {
     ++boot;
-    // Without an id it was remembered before boots were: in this one, as far as is known.
+    // Counts without an id predate the memory of boots; they are taken to be of this boot.
     if (counted.contains(kBootIDKey)) counted = {{kBootNumberKey, boot}};
   }
-  // Boots in their order, and those that were never remembered apart.
+  // Orders boots, and keeps boots that were never remembered apart.
   const std::string prefix = bootID.empty() ? "" : format("%010llu-%s-", boot, bootID.substr(0, 8));
   for (const std::string& controller : *controllers) {
     const auto number =
@@ -190,8 +189,8 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
       if (!count) continue;
       const auto before = counted.number(file);
       counted.set(file, *count);
-      // One that has gone back was started anew. What the first look finds was counted before
-      // anybody asked, and counts as new.
+      // A counter that has gone back has started again. The first look finds errors that nobody has
+      // read, and they count as new.
       const std::uint64_t last = before ? static_cast<std::uint64_t>(before->int64()) : 0;
       const std::uint64_t fresh = *count >= last ? *count - last : *count;
       if (fresh == 0) continue;

@@ -31,7 +31,7 @@ std::string unquoted(std::string_view text) {
   return value;
 }
 
-/// Callers take every entry for a text.
+/// Callers expect every entry to be a text.
 plist::Dictionary stringsOf(const plist::Dictionary& dictionary) {
   auto strings = plist::Dictionary::create(dictionary.size());
   for (const auto& [key, value] : dictionary) {
@@ -78,7 +78,7 @@ std::string LinuxSystemVersion::text() {
 const plist::Dictionary& LinuxSystemVersion::known() {
   if (known_) return known_;
   const std::string path = root_.path(kVersionFile);
-  // From a file that is there and cannot be read nothing is known: what os-release says would look
+  // A file that exists and cannot be read leaves the version unknown: that of os-release would look
   // like an update of the OS.
   const auto content = files_.readIfPresent(path, limits::kPropertyListBytes);
   const bool isMissing = content && !*content;

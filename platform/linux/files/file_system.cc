@@ -19,7 +19,7 @@ namespace {
 constexpr std::string_view kTemporaryPrefix = ".tavrel-";
 constexpr std::string_view kTemporarySuffix = ".tmp";
 
-// Opening must neither wait for the other end of a FIFO nor make a terminal the controlling one.
+// Opening must not wait for the other end of a FIFO, nor make a terminal the controlling one.
 constexpr int kOpenSafely = O_NONBLOCK | O_NOCTTY;
 
 std::string folderOf(const std::string& path) {
@@ -216,11 +216,11 @@ Expected<NewFile> FileSystem::create(const std::string& path, mode_t mode) {
     if (fstat(descriptor.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
       removeStaleTemporaries(folder, fresh);
     }
-    // Owner first: giving a file away takes set-user bits from its mode.
+    // Owner first: changing the owner clears set-user bits of the mode.
     if (const auto former = status(path); former && S_ISREG(former->st_mode)) {
       if ((former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) &&
           fchown(descriptor.get(), former->st_uid, former->st_gid) != 0) {
-        // Only root can; for others the new file is their own.
+        // Only root can do this; others own the new file.
       }
       if (fchmod(descriptor.get(), former->st_mode & 07777U) != 0) {
         const Error error = systemError("set the mode of", path);
@@ -332,8 +332,8 @@ Status FileSystem::syncFolderOf(const std::string& path) {
   return Done{};
 }
 
-// The age is taken by the file system's own clock, as it stamped a file made just now: the
-// process's clock may be shifted, and a temporary file that another process is writing is young.
+// The age is measured by the file system's own clock, from the stamp of a file made just now. The
+// process's clock may be wrong, and another process may still be writing a young temporary file.
 void FileSystem::removeStaleTemporaries(const std::string& folder, const struct stat& fresh) {
   const Folder open(opendir(folder.c_str()));
   if (!open) return;

@@ -20,7 +20,7 @@ std::string_view trimmed(std::string_view text) {
 }
 
 LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
-  // Opening a pipe that nobody writes to would otherwise wait for a writer.
+  // Opening a pipe without a writer would otherwise wait for one.
   descriptor_ = Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   struct stat status {};
   if (!descriptor_ || fstat(descriptor_.get(), &status) != 0) {

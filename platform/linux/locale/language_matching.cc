@@ -17,7 +17,7 @@
 namespace tavrel {
 namespace {
 
-/// What a preferred language is compared by, worked out once.
+/// The properties by which a preferred language is compared, computed once.
 struct Wish {
   explicit Wish(LanguageTag wanted)
       : tag(std::move(wanted)),
@@ -38,7 +38,7 @@ struct Wish {
   std::array<std::string_view, 2> parents;
 
  private:
-  static constexpr int kForeignVariant = 10;  // behind every region without one
+  static constexpr int kForeignVariant = 10;  // after all regions without one
 
   int regionRank(const std::string& region) const {
     if (region == tag.region) return 1;
@@ -49,7 +49,7 @@ struct Wish {
   }
 };
 
-/// One for each name; nothing for a name that is no language or came before.
+/// One for each name; nothing for a name that is not a language or occurred before.
 std::vector<std::optional<LanguageTag>> parseTags(const std::vector<std::string>& names) {
   std::vector<std::optional<LanguageTag>> tags;
   const std::size_t count = std::min(names.size(), limits::kLanguages);

@@ -47,7 +47,7 @@ std::string_view takePart(std::string_view& rest) {
   return part;
 }
 
-/// Files a part behind the language; false when it can be none.
+/// Stores a part that follows the language; false when it is not one.
 bool takeSubtag(LanguageTag& tag, std::string_view part) {
   if (!lettersOrDigits(part)) return false;
   const bool beforeVariant = tag.variant.empty();

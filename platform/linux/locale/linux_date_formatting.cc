@@ -12,8 +12,8 @@
 namespace tavrel {
 namespace {
 
-// Seconds east of UTC at an instant. The C library reads zone files; it is told which by its
-// variable, since it offers no other way.
+// Seconds east of UTC at an instant. The C library reads zone files; the only way to choose one is
+// its environment variable.
 std::int64_t offsetAt(std::int64_t seconds, const std::string& zoneFile) {
   ::setenv("TZ", (':' + zoneFile).c_str(), 1);
   ::tzset();

@@ -23,10 +23,10 @@ constexpr std::string_view kLanguagesFile = "/etc/tavrel/languages";
 constexpr std::string_view kGeneratedLocalesFile = "/etc/locale.gen";
 constexpr std::string_view kGeneratedLocalesFolder = "/usr/lib/locale";
 
-/// The language of texts that nobody translated.
+/// The language of untranslated texts.
 constexpr std::string_view kUntranslated = "en";
 
-/// The value of an assignment, without quotation marks or what stands behind it.
+/// The value of an assignment, without quotation marks and trailing text.
 std::string_view unquoted(std::string_view value) {
   if (value.starts_with('"') || value.starts_with('\'')) {
     const char mark = value.front();
@@ -45,7 +45,7 @@ class LanguageList {
       languages_.push_back(language);
     }
   }
-  /// False when `name` names no language.
+  /// False when `name` does not name a language.
   bool addNamed(std::string_view name) {
     const auto tag = parseLanguageTag(name);
     if (tag) add(tag->text());
@@ -111,7 +111,7 @@ std::vector<std::string> LinuxLocale::preferredLanguages() {
   while (!list.empty()) {
     const std::size_t end = std::min(list.find(':'), list.size());
     const std::string_view name = list.substr(0, end);
-    // What stands behind "C" is never looked for: texts in C exist for everything.
+    // Languages after "C" are never searched: texts in C exist for everything.
     if (name == "C" || name == "POSIX") return languages.take();
     languages.addNamed(name);
     list.remove_prefix(std::min(end + 1, list.size()));

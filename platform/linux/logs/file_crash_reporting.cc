@@ -48,7 +48,8 @@ void FileCrashReporting::FLLogStructuredData(std::uint32_t logType,
   }
 }
 
-// One that cannot be opened is not tried again for each record of a run: its lock is waited for.
+// A file that cannot be opened is not tried again for each record of a run, because each attempt
+// waits for its lock.
 FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t type,
                                                                std::int64_t day) {
   const auto known = recordFiles_.find(type);
@@ -112,8 +113,8 @@ bool FileCrashReporting::hasSupportLog() {
   return isFilled(root_.path(kSupportLog));
 }
 
-// Only the logs below the first free number move. So a roll that was cut short, which leaves such a
-// gap, is taken up again by the next one and costs no log.
+// Only the logs below the first free number move. A roll that was cut short leaves such a gap; the
+// next one completes it, and no log is lost.
 void FileCrashReporting::rollNorvaneCareLogs() {
   if (!hasSupportLog()) return;
   const std::string log = root_.path(kSupportLog);

@@ -18,7 +18,7 @@ constexpr std::string_view kTaskingDomain = "com.norvane.da";
 constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
 constexpr std::size_t kLongestNamePart = 64;
 
-// Usage of the device is for its owner and for a group of operators.
+// Statistics are readable by their owner and a group of operators only.
 constexpr mode_t kMode = 0640;
 
 /// The log's name as the beginning of a file's name.
@@ -135,8 +135,8 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
   return done;
 }
 
-// What a process that was killed while it filed a log has left. Ages are taken by the file system's
-// own clock, as it stamped a file made just now.
+// Removes what a process left that was killed while filing a log. Ages are measured by the file
+// system's own clock, from the stamp of a file made just now.
 void FileSubmission::removeOldMetadata(const std::string& freshMetadata) {
   const auto fresh = FileSystem::status(freshMetadata);
   const auto names = files_.list(folder(Place::Pending));
@@ -162,7 +162,7 @@ void FileSubmission::submitDiagnosticLogs() {
   for (const std::string& file : *files) {
     std::string name = withoutEnding(file, kLogEnding);
     if (name.empty()) {
-      // Metadata follows its log, which stands before it in the list, or went before a process was
+      // Metadata follows its log, which precedes it in the list or moved before a process was
       // killed.
       name = withoutEnding(file, kMetadataEnding);
       if (!name.empty() && !FileSystem::status(join(folder(Place::Pending), name, kLogEnding)) &&

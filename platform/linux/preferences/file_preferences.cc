@@ -185,8 +185,8 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   return Done{};
 }
 
-// A change that the file cannot take, such as a date that is no number or a text beyond all bounds,
-// must not keep the rest of its domain from being written.
+// A change that the file cannot hold, such as a date that is not a number or a huge text, must not
+// keep the rest of its domain from being written.
 Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
                                                       const plist::Dictionary& stored,
                                                       plist::Dictionary& merged,
@@ -223,7 +223,7 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
     const std::string why =
         format("with it the file would have %llu bytes and may have %llu",
                std::uint64_t{bytes->size()}, std::uint64_t{limits::kPreferenceFileBytes});
-    // Encoding anew after each of many small changes would take for ever.
+    // Encoding again after each of many small changes would take for ever.
     std::size_t excess = bytes->size() - limits::kPreferenceFileBytes;
     while (excess > 0 && !changes.empty()) {
       const auto [size, key] = std::move(changes.back());

@@ -105,16 +105,16 @@ EventLoop::Slice LinuxEventLoop::runSlice(std::chrono::milliseconds longest) {
       std::clamp<std::chrono::milliseconds>(longest, std::chrono::milliseconds(0), kLongestSlice);
   holdSignals();
   do {
-    // Asked for first each time: a crowd of ready sources must not stand before it.
+    // Checked first each time, so that a crowd of ready sources cannot delay it.
     if (takeSignal()) return Slice::Terminated;
 
-    // Only one at a time: the kernel moves what it reported to the end of its list, which is fair,
-    // and no event is left over that belongs to a source that a callback has removed.
+    // Only one at a time: the kernel moves a reported source to the end of its list, which is fair,
+    // and no event is left over for a source that a callback has removed.
     epoll_event event;
     const bool isOpen = openPoll();
     const int ready = isOpen ? epoll_wait(poll_.get(), &event, 1, millisecondsUntil(deadline)) : -1;
     if (ready < 0 && (!isOpen || errno != EINTR)) {
-      // Nothing can be waited for, and asking again would only spin.
+      // There is nothing to wait for, and another attempt would only spin.
       std::this_thread::sleep_until(deadline);
       break;
     }

@@ -6,7 +6,7 @@
 namespace tavrel {
 namespace {
 
-// Nobody could be told of a failure.
+// There is nowhere to report a failure.
 void writeAll(int descriptor, std::string_view text) {
   while (!text.empty()) {
     const ssize_t written = ::write(descriptor, text.data(), text.size());

@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-// True when the row does not ask for the field, or asks for what the request has.
+// True when the row has no such condition, or the request meets it.
 template <class Word>
 bool hasField(const plist::Dictionary& row, std::string_view key, std::optional<Word> inRequest) {
   const plist::Value wanted = row.get(key);

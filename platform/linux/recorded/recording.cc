@@ -57,7 +57,7 @@ std::vector<plist::Dictionary> rowsOf(const plist::Dictionary& record, std::stri
   return rows;
 }
 
-// Adds what earlier parts have not said.
+// Adds what earlier parts lack.
 void mergeHub(plist::Dictionary& merged, const RecordingPart& part, RefusalLog* refusals) {
   const auto isRefused = [&](std::string_view key, const char* where, const char* wanted) {
     if (wanted && refusals) {

@@ -25,7 +25,7 @@ std::vector<RecordingFolder::Stamp> RecordingFolder::stampFiles() {
   for (const std::string& name : *names) {
     if (!name.ends_with(kEnding)) continue;
     std::string path = folder + '/' + name;
-    // A file that has gone since it was listed is no part.
+    // A file removed since the listing is not a part.
     const auto status = FileSystem::status(path);
     if (!status) continue;
     stamps.push_back({std::move(path), status->st_dev, status->st_ino, status->st_size,
@@ -34,8 +34,8 @@ std::vector<RecordingFolder::Stamp> RecordingFolder::stampFiles() {
   return stamps;
 }
 
-// Stamps are taken before the files are read: a file that is replaced in between is read again by
-// the next update.
+// Stamps are taken before the files are read, so that the next update reads again a file that was
+// replaced in between.
 bool RecordingFolder::update(std::vector<RecordingPart>& parts) {
   std::vector<Stamp> stamps = stampFiles();
   if (stamps == stamps_) return false;

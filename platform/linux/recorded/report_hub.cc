@@ -18,8 +18,8 @@ constexpr std::uint32_t kOpen = kIOReportUserClientOpen;
 constexpr std::uint32_t kConfigure = kIOReportUserClientConfigureInterests;
 constexpr std::uint32_t kUpdate = kIOReportUserClientUpdateKernelBuffer;
 
-// What readers take an absent id for. The driver beside it is 0: a channel without both ids does
-// not match.
+// The id that readers take as absent. Its driver is 0, so a channel without both ids does not
+// match.
 constexpr std::uint64_t kNoChannel = std::uint64_t{1} << 63;
 constexpr std::size_t kLargestGroupElements = 0xFFFF;
 
@@ -88,7 +88,7 @@ class ReportHubClient final : public UserClient {
     return kKernelNoMemory;
   }
 
-  // A further call replaces the buffer; mappings of the earlier one keep their content.
+  // Another call replaces the buffer; mappings of the earlier one keep their content.
   KernelReturn configure(ByteSpan interests, std::uint64_t& bufferID) {
     const auto count = loadLittle32(interests, 0);
     if (!count || loadLittle32(interests, 4) != 0U ||

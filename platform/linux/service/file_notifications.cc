@@ -46,12 +46,12 @@ Expected<std::uint64_t> FileNotifications::tryPost(std::string_view name) {
   const auto path = pathOf(name);
   if (!path) return path.error();
   FileSystem files;
-  // Not the counter itself: whoever may read that could lock it and hold up everybody.
+  // Not the counter itself: everybody who may read it could lock it and hold the others up.
   const auto lock = files.lockFile(folder_ + "/.lock");
   if (!lock) return lock.error();
 
   const auto before = count(name);
-  // More than any counter has reached, so that everyone who waits takes it for news.
+  // More than any counter has reached, so that all waiting processes see a change.
   const std::uint64_t now = before ? *before + 1 : microsecondsSince1970();
   const std::string text = format("%llu\n", now);
   if (const auto written = files.replace(*path, asBytes(text), 0644); !written) {

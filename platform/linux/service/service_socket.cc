@@ -41,8 +41,8 @@ Status removeStale(const std::string& path, const SocketAddress& address) {
     return Error{format("cannot listen at %s: the file there is no socket; remove it", path)};
   }
   // The service manager listens without the lock, and would start the service for a connection. A
-  // socket of another type never becomes one: it is refused as such where somebody listens, and as
-  // without an owner where nobody does.
+  // socket of another type never makes one: the kernel refuses its type when a process listens, and
+  // reports a missing owner when none does.
   const Descriptor probe = newSocket(SOCK_DGRAM);
   if (!probe) return systemError("open a socket for", path);
   if (connect(probe.get(), address.get(), address.size()) == 0 || errno != ECONNREFUSED) {
@@ -105,7 +105,7 @@ Expected<ServiceSocket> ServiceSocket::open(const DeviceRoot& root, std::string_
 
   ServiceSocket result(newSocket(SOCK_SEQPACKET));
   if (!result.socket_) return systemError("open a socket for", path);
-  // The file gets the mode that its socket has: there is no moment in which others may connect.
+  // The file gets the mode of its socket, so there is no moment in which others may connect.
   if (fchmod(result.get(), 0600) != 0 || bind(result.get(), address->get(), address->size()) != 0 ||
       listen(result.get(), kBacklog) != 0) {
     return systemError("listen at", path);

@@ -17,7 +17,7 @@ namespace tavrel {
 
 namespace {
 
-/// The first descriptor that is handed over, after the standard streams.
+/// The first descriptor from the service manager, after the standard streams.
 constexpr int kFirstDescriptor = 3;
 
 std::optional<int> numberFromEnvironment(const char* variable) {

@@ -39,7 +39,7 @@ class SocketListener::Peer final : public PeerConnection {
 
   bool hasFailed() const { return hasFailed_; }
 
-  /// Makes its end an event, as its beginning was.
+  /// Makes the end of the peer an event, like its beginning.
   void count() { counts_ = true; }
 
  private:
@@ -127,7 +127,7 @@ void SocketListener::acceptFailed(int code) {
     case ECONNABORTED:
     case EACCES:
     case EPERM:
-      return;  // about one peer, which has gone
+      return;  // about one peer, which has left
     case EMFILE:
     case ENFILE:
     case ENOBUFS:

@@ -13,8 +13,8 @@ namespace tavrel {
 
 namespace {
 
-/// Lets every peer have a descriptor, as far as the hard limit goes; the usual soft limit of 1,024
-/// is there for programs that use select.
+/// Allows a descriptor for each peer, up to the hard limit; the usual soft limit of 1,024 exists
+/// for programs that use select.
 void raiseDescriptorLimit() {
   constexpr rlim_t kWanted = limits::kServicePeers + 128;
   rlimit limit;

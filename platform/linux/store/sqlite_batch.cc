@@ -14,7 +14,7 @@ namespace {
 // their keys: the more there are, the fewer pages and chunks are written twice.
 constexpr std::size_t kPendingBytes = 8U << 20;
 
-// What a distribution costs beside its records while it waits.
+// The memory of a waiting distribution besides its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
 
 constexpr std::int64_t kValuesPerSeries = std::int64_t{kValuesPerChunk} << kChunkOrdinalBits;
@@ -176,7 +176,7 @@ SqliteBatch::PendingSeries& SqliteBatch::pendingSeries(const SeriesName& name) {
 void SqliteBatch::writeDistributions() {
   if (pending_.empty()) return;
   begin();
-  // In the order in which a day is read, so that reading goes forward through the file.
+  // In the order in which a day is read, so that reads go forward through the file.
   std::vector<const PendingMap::value_type*> series;
   series.reserve(pending_.size());
   for (const auto& entry : pending_)

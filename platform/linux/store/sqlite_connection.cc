@@ -44,7 +44,7 @@ Explanation explain(int code) {
   }
 }
 
-// Why the system does not let the database be written; 0 when it does or when there is none.
+// Why the system forbids writing the database; 0 when it does not, or when there is no database.
 int obstacleToWriting(sqlite3* connection) {
   const char* const name = sqlite3_db_filename(connection, "main");
   const std::string path = name ? name : "";
@@ -56,9 +56,9 @@ int obstacleToWriting(sqlite3* connection) {
   return 0;
 }
 
-// The system's code behind a failure, 0 when there is none. SQLite tries again for reading what it
-// may not open for writing, and then tells the code of the second attempt: the first one's is asked
-// for anew.
+// The system's code for a failure, 0 when there is none. When SQLite may not open a file for
+// writing, it tries again for reading and reports the code of that attempt; this asks for the code
+// of the first one.
 int systemCodeOf(sqlite3* connection, int code) {
   switch (code & 0xFF) {
     case SQLITE_IOERR:
@@ -142,8 +142,8 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::Read:
-      // A user who may write takes part in the log as a writer does, and so leaves none behind.
-      // SQLite opens a write-protected file for reading.
+      // A user who may write uses the log like a writer, and so leaves no log behind. SQLite opens
+      // a write-protected file for reading.
       flags |= SQLITE_OPEN_READWRITE;
       break;
     case Access::Immutable:
@@ -155,7 +155,7 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
     sqlite3_busy_handler(handle_, waitForLock, busy_.get());
-    // The file may come from anywhere: nothing that its schema says is to run.
+    // The file may come from anywhere, so nothing in its schema may run.
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
@@ -217,7 +217,7 @@ void SqliteStatement::bind(int index, std::int64_t value) {
 }
 
 void SqliteStatement::bind(int index, std::string_view bytes) {
-  // A null address would bind NULL in the place of a blob of no bytes.
+  // A null address would bind NULL instead of an empty blob.
   const char* const data = bytes.data() ? bytes.data() : "";
   check(sqlite3_bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
 }
@@ -234,7 +234,7 @@ bool SqliteStatement::step() {
 }
 
 void SqliteStatement::reset() {
-  // The code of a reset repeats the failure of the step before, which has been told.
+  // The code of a reset repeats the failure of the last step, which has been reported.
   sqlite3_reset(handle_);
 }
 

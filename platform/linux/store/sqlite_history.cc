@@ -21,7 +21,7 @@ std::optional<std::string> keyAbove(std::string_view prefix) {
 }
 
 StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
-  // Of a long key its beginning says enough.
+  // The beginning of a long key says enough.
   constexpr std::size_t kShownBytes = 200;
   std::string message = "distribution ";
   appendQuoted(message, key.substr(0, kShownBytes));
@@ -198,7 +198,7 @@ Expected<SqliteHistory::Holdings> SqliteHistory::holdings() {
   Holdings holdings;
   if (!store_) return holdings;
   try {
-    // One look-up for each day held, in the place of a walk over all rows.
+    // One look-up for each day in the store, instead of a walk over all rows.
     SqliteStatement scalars(store_->connection, "SELECT min(day) FROM scalars WHERE day >= ?1");
     SqliteStatement distributions(store_->connection,
                                   "SELECT min(day) FROM distributions WHERE day >= ?1");
@@ -232,7 +232,7 @@ void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandl
   bool stop = false;
   while (!stop && rows.step()) {
     const std::string_view key = rows.bytes(0);
-    // The query for one day has no upper bound: the first key without the prefix is behind all
+    // The query for one day has no upper bound: the first key without the prefix comes after all
     // that have it.
     if (!key.starts_with(selection.prefix)) break;
     rowHandler(key, static_cast<std::int32_t>(rows.integer(1)), rows.integer(2), stop);

@@ -12,8 +12,8 @@ namespace {
 
 constexpr std::int64_t kSchemaVersion = 1;
 
-// Of a new store. Values are read as fast as the system hands out their pages, and that is twice as
-// fast by 64 KiB as by SQLite's 4 KiB. Commits, which write whole pages, are few.
+// For a new store. Reading values is as fast as the system delivers pages: twice as fast in 64 KiB
+// as in SQLite's 4 KiB. Commits, which write whole pages, are few.
 constexpr const char* kPageSize = "PRAGMA page_size = 65536";
 
 // The log is moved into the database when it is longer than 4 MiB, as with pages of 4 KiB.
@@ -60,7 +60,7 @@ bool hasTables(SqliteConnection& connection) {
                          "update tavrel, or move the file away"};
 }
 
-// Opening a pipe or a device in the store's place could block for ever.
+// Opening a pipe or a device in place of the store could block for ever.
 bool checkIsFile(const std::string& path) {
   struct stat status;
   if (stat(path.c_str(), &status) != 0) {
@@ -107,8 +107,8 @@ SqliteConnection openStoreForWriting(const std::string& path,
     }
   }
   if (version != kSchemaVersion) refuseSchema(version);
-  // Commits are few and hold a whole run's values, so each is flushed: what was said to be kept is
-  // kept across a power cut too.
+  // Commits are few and hold a whole run's values, so each is flushed: what was reported as kept
+  // also survives a power cut.
   connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
   connection.execute(kAutomaticCheckpoint);
   return connection;
@@ -122,7 +122,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
     if (!isReadable(connection)) return std::nullopt;
     return ReadableStore{std::move(connection), false};
   } catch (const StoreFailure& failure) {
-    // Taking part in the log needs files of its own beside the store, and room for them.
+    // Using the log takes files in the store's folder, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
     if (hasLog(path)) {
       if (failure.fault == StoreFault::Device) throw;
@@ -132,7 +132,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
                              "written: have a user who may write run 'tavrelctl stat list' once"};
     }
   }
-  // Without a log nobody is writing, and all there is stands in the file itself.
+  // Without a log no process is writing, and the file itself is complete.
   SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
   if (!isReadable(connection)) return std::nullopt;
   return ReadableStore{std::move(connection), true};

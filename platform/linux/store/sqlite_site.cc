@@ -18,7 +18,7 @@ std::string folderOf(const std::string& path) {
   return path.substr(0, path.rfind('/') + 1);
 }
 
-// A name of which neither the file nor its log files exist yet.
+// A name for which neither the file nor its log files exist yet.
 std::string freeName(const std::string& wanted) {
   std::string name = wanted;
   for (int attempt = 1; FileIdentity::of(name) || FileIdentity::of(name + "-wal"); ++attempt) {
@@ -81,8 +81,8 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
     const StoreFolderLock lock(path, *busy);
     if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
     const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
-    // The log goes first: were the process killed in between, the file would be found damaged once
-    // more, while a log without its file would be taken for a new store's.
+    // The log goes first. If the process is killed in between, the file is found damaged again; a
+    // log left without its file would be taken for that of a new store.
     if (!moveFile(path + "-wal", name + "-wal") || !moveFile(path + "-shm", name + "-shm") ||
         !moveFile(path, name)) {
       throw StoreFailure{StoreFault::Refused, std::string("it cannot be set aside: ") +

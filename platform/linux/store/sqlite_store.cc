@@ -98,7 +98,7 @@ void SqliteStore::BHClientCheckpoint() {
   // The last process that closes the store empties its log and removes it.
   if (!FileIdentity::of(site_.path + "-wal")) return;
   const auto failure = attempt([this](const auto& identity) {
-    // Just set aside, and the log with it.
+    // The store has just been set aside with its log.
     if (!identity) return;
     SqliteConnection connection = openForWriting();
     if (!connection.checkpoint()) {

@@ -89,7 +89,7 @@ bool writeWhole(int descriptor, std::string_view bytes) {
   return true;
 }
 
-/// An entry beyond what a datagram holds goes in a sealed memory file.
+/// An entry too large for a datagram travels in a sealed memory file.
 bool sendInMemoryFile(int socket, std::string_view entry) {
   const Descriptor file(memfd_create("tavrel-log", MFD_CLOEXEC | MFD_ALLOW_SEALING));
   if (!file || !writeWhole(file.get(), entry)) return false;
@@ -151,7 +151,7 @@ bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view message) {
   while (send(journal_.get(), entry.data(), entry.size(), MSG_NOSIGNAL) < 0) {
     if (errno == EINTR) continue;
     if (errno == EMSGSIZE || errno == ENOBUFS) return sendInMemoryFile(journal_.get(), entry);
-    // The journal may have been started anew; entries sent meanwhile go by the stream.
+    // The journal may have restarted; entries go to the stream meanwhile.
     connectToJournal();
     return false;
   }
@@ -164,7 +164,7 @@ void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) con
   std::string_view continuation = "\n  ";
   std::string prefix;
   if (streamIsJournal_) {
-    // The journal takes time and level from its own stamp and from this prefix of every line.
+    // The journal takes the time from its own stamp and the level from this prefix of each line.
     prefix = {'\n', '<', names.priority, '>'};
     continuation = prefix;
     line = prefix.substr(1);
