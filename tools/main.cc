@@ -9,8 +9,7 @@
 
 namespace {
 
-// Nothing when standard output is no terminal; a terminal that does not know its width counts as
-// 80 columns.
+// Nothing when standard output is not a terminal; a terminal of unknown width counts as 80 columns.
 std::optional<std::size_t> terminalColumns() {
   if (!isatty(STDOUT_FILENO)) return std::nullopt;
   winsize size{};

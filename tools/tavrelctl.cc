@@ -23,7 +23,7 @@
 namespace tavrel {
 namespace {
 
-// What is wrong with a line, and the help of the subcommand that was being parsed.
+// What is wrong with a command line, and which subcommand's help to read.
 std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   const CLI::App* command = &app;
   std::string line = app.get_name();

@@ -37,7 +37,7 @@ bool checkDomain(ToolContext& context, const std::string& domain) {
 }
 
 void failAbsent(ToolContext& context, const Arguments& arguments) {
-  // An unreadable domain has been complained of.
+  // An unreadable domain has been reported.
   if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   context.fail(
       format("no preference %s in domain %s: 'tavrelctl prefs list %s' shows what there is",
@@ -78,7 +78,7 @@ Expected<plist::Value> valueOf(ToolContext& context, const Arguments& arguments)
   return decodeDocument(arguments.value, "VALUE");
 }
 
-// A permission that was stored as the text "true" permits nothing; better said than searched for.
+// A permission that was stored as the text "true" permits nothing, so say so.
 void noteTextThatReadsOtherwise(ToolContext& context, const Arguments& arguments) {
   if (arguments.kindGiven) return;
   const std::string& text = arguments.value;
@@ -101,7 +101,7 @@ void set(ToolContext& context, const Arguments& arguments) {
   const auto xml = plist::writeXml(*value);
   if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
   noteTextThatReadsOtherwise(context, arguments);
-  // As it will be read back: dates, for one, lose their fraction.
+  // As it will be read back: for example, dates lose their fraction.
   store(context, arguments, *plist::readXml(asBytes(*xml)));
 }
 

@@ -99,7 +99,7 @@ void printCount(ToolContext& context, const std::string& name, std::uint64_t cou
 }
 
 void wait(ToolContext& context, const std::string& name, const std::string& timeout) {
-  // Beyond what any wait lasts; a conversion of more would not be defined.
+  // Longer than any wait; converting more would be undefined.
   constexpr double kLongestSeconds = 1e9;
   double longest = kLongestSeconds;
   if (!timeout.empty()) {

@@ -24,7 +24,7 @@ namespace {
 /// More findings than this say nothing new about a document.
 constexpr std::size_t kFindingsShown = 20;
 
-/// A tasking as preferences hold it; whatever they hold, since others write them too.
+/// A tasking as preferences hold it. Its values may be anything, since others write them too.
 struct Tasking {
   plist::Value identifier;
   plist::Value system;  // only of an applied one
@@ -105,7 +105,7 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
 
 void show(ToolContext& context) {
   const Taskings taskings(context);
-  // What cannot be read must not look like what is not there.
+  // Unreadable must not look like absent.
   if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   if (context.json()) {
     const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);

@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// The order in which logs were filed. Metadata tells the second, the file the rest.
+// The order in which logs were filed: metadata has the second, the file the rest.
 bool isOlder(const FiledLog& a, const FiledLog& b) {
   const auto order = [](const FiledLog& log) {
     const auto time = log.metadata.date(kLogMetadataTime);

@@ -88,7 +88,7 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   return LogEnvelope{"file", name, {}};
 }
 
-// Logs of other services are texts of their own form.
+// Logs of other kinds are texts with their own form.
 void showText(ToolContext& context, const LogEnvelope& envelope, std::string_view bytes) {
   if (context.json()) {
     Json log = jsonOfEnvelope(envelope);
@@ -140,7 +140,7 @@ plist::Dictionary metadataOf(Platform& platform, const CapturedLog& log) {
 void preview(ToolContext& context, const Arguments& arguments) {
   OverlayPlatform overlay(context.linuxPlatform());
   Platform& platform = overlay.platform();
-  // A document that lacks something must not pass for the whole.
+  // An incomplete document must not look like a whole one.
   std::vector<std::string> errors;
   overlay.setEventHandler([&](const OverlayEvent& event) {
     if (event.kind != OverlayEvent::Kind::LogLine) return;

@@ -24,7 +24,7 @@ void printField(std::ostream& out, std::string_view name, std::string_view text)
   out << format("%-12s  ", name) << printable(text) << '\n';
 }
 
-// A value of the header: texts plain, everything else as its kind shows.
+// A value of the header: texts plain, other values so that they show their kind.
 std::string fieldText(const plist::Value& value) {
   if (const auto text = value.string()) return std::string(*text);
   return inlineText(value);

@@ -38,7 +38,7 @@ struct Group {
   bool (*holds)(std::string_view key);
 };
 
-// The first group that holds a key has it.
+// A key belongs to the first group that lists it.
 constexpr Group kGroups[] = {
     {"Write amplification", "write_amplification",
      [](std::string_view key) { return key == "UserWamp" || key == "IntermediateWamp"; }},
@@ -83,7 +83,7 @@ std::optional<NandLog> parseNandLog(std::string_view text) {
   std::string_view body = takeUntil(text, "\n");
   while (!body.empty()) {
     const std::string_view item = takeUntil(body, ";");
-    // Values have no colon; nobody promises that of keys.
+    // Values have no colon; keys may have one.
     const std::size_t colon = std::min(item.rfind(':'), item.size());
     log.items.emplace_back(item.substr(0, colon), item.substr(std::min(colon + 1, item.size())));
   }
@@ -93,7 +93,7 @@ std::optional<NandLog> parseNandLog(std::string_view text) {
 /// When the next log may be written.
 struct NextLog {
   std::optional<plist::Date> last;
-  std::optional<plist::Date> from;  // nothing: at the next run
+  std::optional<plist::Date> from;  // nothing means at the next run
   bool isLastInFuture = false;
 };
 
@@ -132,7 +132,7 @@ Json jsonOf(const NextLog& next) {
           {"allowed_from", next.from ? Json(isoDateText(*next.from)) : Json(nullptr)}};
 }
 
-/// A number, and other texts as they are.
+/// A number, or another text unchanged.
 Json jsonOfNumber(std::string_view text) {
   Json number = Json::parse(text, nullptr, false);
   return number.is_number() ? number : Json(text);

@@ -42,7 +42,7 @@ std::optional<unsigned> hexDigit(char c) {
   return static_cast<unsigned>(at);
 }
 
-/// The name of an element of a statistic: what `nand parse` lists arrays by.
+/// The name of an element of a statistic, as `nand parse` lists arrays.
 struct Element {
   const StatisticKey* statistic;
   std::uint32_t index;
@@ -69,7 +69,7 @@ class Builder {
   std::string take() { return std::move(bytes_); }
 
  private:
-  /// Elements that follow one another share a record; this is the one that may go on.
+  /// Consecutive elements share a record; this is the one that may continue.
   struct Run {
     const StatisticKey* statistic = nullptr;
     std::size_t recordAt = 0;  // in the bytes

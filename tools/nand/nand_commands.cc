@@ -64,7 +64,8 @@ void info(ToolContext& context) {
                       info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
 }
 
-// A buffer that cannot be parsed is a failure, but what it said until then is still worth showing.
+// A buffer that cannot be parsed is a failure, but the part before the fault is still worth
+// showing.
 int parseInto(ToolContext& context, const std::string& file, std::string_view bytes,
               ASPContext& statistics) {
   const int result = ASPParseBufferToCxt(statistics, asBytes(bytes));

@@ -9,12 +9,12 @@
 namespace tavrel {
 namespace {
 
-// A record of the fixed layout never needs more than four characters a byte.
+// A record of the fixed layout never needs more than four characters per byte.
 constexpr std::size_t kCharactersPerByte = 4;
 constexpr std::size_t kCharactersOfKey = 4096;
 
-// Formats of a device may widen every field to a page, and its records may lie on each other. The
-// whole text of the largest buffer of the fixed layout has its place.
+// A device's formats may widen each field to a page, and its records may coincide. There is room
+// for the whole text of the largest buffer of the fixed layout.
 constexpr std::size_t kLongestText = 320U << 20;
 
 class Taken final : public StackSnapshot {
@@ -31,7 +31,7 @@ class Taken final : public StackSnapshot {
 }  // namespace
 
 Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor) {
-  // The renderer gives one answer for a text that does not fit and a descriptor that it refuses.
+  // The renderer has the same result for a text that does not fit and a descriptor that it refuses.
   if (descriptor) {
     const auto checked = readSnapshotDescriptor(*descriptor, records.size());
     if (!checked) return checked.error();

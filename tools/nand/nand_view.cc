@@ -20,7 +20,7 @@
 namespace tavrel {
 namespace {
 
-// Keys with one stem and numbers behind it are a histogram from so many on.
+// So many keys that differ only in a number at their end make a histogram.
 constexpr std::size_t kFewestBuckets = 3;
 
 constexpr std::uint64_t kSectorBytes = 4096;  // of logical traffic
@@ -142,7 +142,7 @@ class View {
     out_ << printable(text) << '\n';
   }
 
-  // Prints what is there and was not printed yet.
+  // Prints the keys that exist and were not printed yet.
   void printGroup(const Group& group) {
     Table table({{""}, {"", Table::Align::Right}, {""}}, 2);
     for (const std::string_view key : group.keys) {

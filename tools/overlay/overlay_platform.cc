@@ -16,7 +16,7 @@
 namespace tavrel {
 namespace {
 
-// What is below an overlay could not change a file if it tried.
+// The services below an overlay cannot change a file, even by mistake.
 class ReadOnlyFileSystem final : public FileSystem {
  protected:
   int openFile(const char* path, int flags, mode_t mode) override {
@@ -37,7 +37,7 @@ class ReadOnlyFileSystem final : public FileSystem {
 
 }  // namespace
 
-// A platform of its own below, so that what its services have to say goes to the overlay too.
+// It has a platform of its own below, so that messages of those services go to the overlay too.
 struct OverlayPlatform::Services {
   explicit Services(LinuxPlatform& device) : root(device.root()) {
     platform.applications = applications;

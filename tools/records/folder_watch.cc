@@ -12,7 +12,7 @@
 namespace tavrel {
 namespace {
 
-// Watches the folder or, until that is made, the nearest one above it. Watching one again changes
+// Watches the folder or, until it exists, the nearest one above it. Watching a folder twice changes
 // nothing.
 Status watchNearest(int changes, const std::string& folder) {
   for (std::string at = folder, missing;;) {

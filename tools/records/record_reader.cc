@@ -45,7 +45,7 @@ Status RecordReader::read(bool takesRest, const LineHandler& handler) {
     offset_ += got;
 
     std::size_t begin = 0;
-    std::size_t searched = kept;  // what was kept has no line end
+    std::size_t searched = kept;  // the kept text has no line end
     for (std::size_t end; (end = rest_.find('\n', searched)) != std::string::npos;) {
       handler(std::string_view(rest_).substr(begin, end - begin), ++lines_);
       begin = searched = end + 1;

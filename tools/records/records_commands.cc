@@ -147,7 +147,7 @@ class RecordsView {
     if (!read) tellOnce(read.error().message);
   }
 
-  // JSON as it was filed, so that no digit of a number is lost.
+  // JSON exactly as it was filed, so that no digit of a number is lost.
   void print(std::vector<Row>& rows) {
     std::stable_sort(rows.begin(), rows.end(),
                      [](const Row& a, const Row& b) { return a.time < b.time; });

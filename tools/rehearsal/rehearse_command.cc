@@ -20,7 +20,7 @@ namespace {
 
 using Kind = OverlayEvent::Kind;
 
-/// Of more events of one kind in a row only so many are shown.
+/// The most events of one kind in a row that are shown.
 constexpr std::size_t kShownInARow = 8;
 
 enum class Shows : std::uint8_t { Nothing, Text, Value, Bytes, Rows };
@@ -104,7 +104,7 @@ std::string lineOf(const OverlayEvent& event) {
   return line + valueText(event.value, phrase.shows);
 }
 
-/// What a step shows: a line, and how often it came.
+/// One line of a step, and how often it occurred.
 struct StepLine {
   Kind kind;
   std::string text;
@@ -112,10 +112,10 @@ struct StepLine {
   std::uint64_t times = 1;
 };
 
-// Reads that repeat themselves stand once, where they came first. Records are only counted.
+// Repeated reads appear once, at their first place. Records are only counted.
 std::vector<StepLine> linesOf(const RehearsedStep& step, bool verbose) {
   std::vector<StepLine> lines;
-  std::map<std::string, std::size_t> reads;  // where a line stands
+  std::map<std::string, std::size_t> reads;  // the position of a line
   for (const OverlayEvent& event : step.events) {
     const bool isDebug = event.kind == Kind::LogLine && event.subject == "debug";
     if (isDebug && !verbose) continue;
@@ -195,7 +195,7 @@ std::string summaryOf(const Totals& totals) {
   return text.empty() ? "nothing" : text;
 }
 
-/// Says that the run would have met errors of the system, which a rehearsal meets the same way.
+/// Reports errors of the system that the run would also have met.
 void failOnErrors(ToolContext& context, const Rehearsal& rehearsal) {
   std::uint64_t errors = 0;
   std::string first;

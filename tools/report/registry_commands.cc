@@ -29,7 +29,7 @@ struct Arguments {
   std::string file;
 };
 
-// What could be read. When that is not all, notes have said why, and the exit status is 1.
+// The readable recordings. When some are missing, notes have said why, and the exit status is 1.
 struct CurrentRecording {
   plist::Dictionary content;
   bool isWhole;

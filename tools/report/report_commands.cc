@@ -40,7 +40,7 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
                                              const ReportSelection& selection) {
   auto channels = selectChannels(noting.platform(), selection);
   if (noting.hasErrors()) context.setExitStatus(kExitFailure);
-  // Of a driver whose channels cannot be read the notes have the library's words only.
+  // For a driver whose channels cannot be read, the notes have only the library's words.
   if (channels && noting.hasPrinted()) {
     context.note("such drivers are left out: 'tavrelctl registry show ID' shows what they publish");
   }
@@ -73,7 +73,7 @@ class Sampler {
 
   explicit operator bool() const { return subscription_ != nullptr; }
 
-  /// An empty handle after having said why.
+  /// An empty handle after a message that says why.
   plist::Dictionary sample() {
     std::optional<ErrorObject> error;
     auto samples = IOReportCreateSamples(subscription_.get(), subscribed_, &error);
@@ -109,7 +109,7 @@ void list(ToolContext& context, const Arguments& arguments) {
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
               std::uint32_t number, std::int32_t missing) {
   if (context.json()) {
-    // Of several each is one line, so that readers can tell where one ends.
+    // Each of several samples is one line, so that readers can see where one ends.
     JsonList list(
         context.out(), {{"sample", number}, {"delta", arguments.delta}, {"missing", missing}},
         "channels", arguments.count == 1 ? JsonList::Layout::Document : JsonList::Layout::Line);
@@ -126,8 +126,8 @@ void printOne(ToolContext& context, const Arguments& arguments, const plist::Dic
   context.out().flush();
 }
 
-// Deltas, without the channels that have none. A note names the first of them whenever their number
-// changes.
+// Deltas, without the channels that have none. When the number of those changes, a note names the
+// first.
 class Changes {
  public:
   explicit Changes(ToolContext& context) : context_(context) {}
@@ -175,7 +175,8 @@ void sample(ToolContext& context, const Arguments& arguments) {
 // The system's own words. Some of them have no line end.
 void print(ToolContext& context, const std::optional<std::string>& description) {
   if (!description) return;
-  // Names come from drivers: what would steer a terminal is shown, but not the lines' own ends.
+  // Names come from drivers, so terminal control characters are escaped, except for the lines' own
+  // ends.
   std::string_view rest = *description;
   while (!rest.empty()) {
     const std::size_t end = std::min(rest.find('\n'), rest.size());

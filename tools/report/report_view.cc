@@ -39,13 +39,13 @@ std::string signedText(std::int64_t value) {
   return value == kInvalidValue ? "-" : std::to_string(value);
 }
 
-// A count, which is unsigned but as a difference.
+// A count, unsigned unless it is a difference.
 std::string countText(std::int64_t value, bool isDelta) {
   if (value == kInvalidValue || isDelta) return signedText(value);
   return std::to_string(static_cast<std::uint64_t>(value));
 }
 
-// Says when another driver, group or subgroup begins.
+// Notices the beginning of another driver, group or subgroup.
 class Place {
  public:
   explicit Place(const plist::Dictionary& channel)
@@ -175,7 +175,7 @@ class SamplePrinter {
                std::move(rows));
   }
 
-  // Once there are no bounds, there are none for the buckets behind either.
+  // When one bucket has no bounds, the ones after it have none either.
   static std::string boundsText(const plist::Dictionary& channel, std::int32_t bucket,
                                 bool& hasBounds) {
     std::int64_t lower = 0;

@@ -15,7 +15,7 @@ constexpr std::size_t kWidestBar = 40;
 constexpr std::size_t kNarrowestBar = 8;
 constexpr std::size_t kColumnsInPipe = 80;
 
-// The ends of a bucket, from a label such as "(-inf, 10]". Labels that are no such text go last.
+// The ends of a bucket, from a label such as "(-inf, 10]". Other labels go last.
 std::pair<double, double> endsOf(std::string_view label) {
   constexpr double kLast = std::numeric_limits<double>::infinity();
   const auto read = [](std::string_view text) {

@@ -66,7 +66,7 @@ Expected<std::string> readInput(ToolContext& context, const std::string& file,
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
   auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
   if (!value) {
-    // The decoder does not know that JSON would do as well.
+    // The decoder does not know that JSON is also accepted.
     constexpr std::string_view kNotOne = "not a property list";
     std::string_view reason = value.error().message;
     if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};

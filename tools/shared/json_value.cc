@@ -22,15 +22,15 @@ constexpr std::string_view kDataMember = "$data";
 constexpr std::string_view kDateMember = "$date";
 constexpr std::string_view kRealMember = "$real";
 
-// The calendar arithmetic is good for years of 40 bits.
+// The calendar arithmetic covers years of 40 bits.
 constexpr double kLargestSeconds = 3e16;
 
 Json special(std::string_view member, std::string text) {
   return {{std::string(member), std::move(text)}};
 }
 
-// Members go to the end of the object's list: looking for an earlier one of the same name would
-// make large dictionaries quadratic, and a dictionary has none.
+// Members go to the end of the object's list: a search for an earlier one of the same name would
+// make large dictionaries quadratic, and dictionaries have no duplicates.
 void appendMember(Json& object, std::string key, Json value) {
   object.get_ref<Json::object_t&>().emplace_back(std::move(key), std::move(value));
 }
@@ -81,7 +81,7 @@ bool isSpecial(std::string_view key) {
   return key == kDataMember || key == kDateMember || key == kRealMember;
 }
 
-// Builds values straight from the parser's events, so that numbers keep every digit and a deep
+// Builds values directly from the parser's events, so that numbers keep every digit and a deep
 // document is refused before anything recurses over it.
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
@@ -143,7 +143,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  private:
   struct Level {
     plist::Value container;
-    std::string key;         // of the member that comes next
+    std::string key;         // of the next member
     bool isSpecial = false;  // a member with one of the special names was seen
   };
 

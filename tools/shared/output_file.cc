@@ -16,13 +16,13 @@ Status writeOutput(ToolContext& context, const std::string& file, std::string_vi
     context.out() << bytes;
     return Done{};
   }
-  // A device or pipe would be replaced by a file, which is never meant.
+  // Replacing a device or a pipe by a file is never intended.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
     return Error{format("cannot write %s: it is no regular file: use -o - and redirect", file)};
   }
   const auto path = std::filesystem::absolute(file);
-  // Folders that are missing are a slip of the pen here, not something to make.
+  // Missing folders are a typing error here; do not make them.
   const auto folder = path.parent_path().string();
   if (!FileSystem::status(folder)) {
     const char* const reason = std::strerror(errno);

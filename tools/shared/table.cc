@@ -12,10 +12,10 @@ namespace {
 constexpr std::string_view kGap = "  ";
 constexpr std::size_t kNarrowestColumn = 8;
 
-// One long key would else push every row of a listing in a pipe far to the right.
+// Otherwise one long key would push all rows of a listing in a pipe far to the right.
 constexpr std::size_t kWidestPadding = 48;
 
-// Control characters, and the marks that turn the direction of the text around them.
+// Control characters, and marks that change the direction of the text around them.
 bool actsOnTerminal(char32_t codePoint) {
   return codePoint < 0x20 || (codePoint >= 0x7F && codePoint < 0xA0) ||
          (codePoint >= 0x200E && codePoint <= 0x200F) ||

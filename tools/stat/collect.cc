@@ -40,8 +40,8 @@ enum class Keeping : std::uint8_t {
   Series,  // a distribution, appended to by each reading
 };
 
-// What one statistic makes of a reading and the one before, which is null for the first. Nothing
-// when it cannot be told.
+// Computes one statistic from a reading and the one before, which is null for the first. Nothing
+// when it is unknown.
 using Measure = std::optional<double> (*)(const MachineReading& now, const MachineReading* before,
                                           double secondsBetween);
 
@@ -57,8 +57,8 @@ std::optional<double> real(const std::optional<Number>& number, double divisor =
   return static_cast<double>(*number) / divisor;
 }
 
-// What a counter has grown by. A counter that has gone back was restarted, or lost a device: there
-// is nothing to tell then.
+// The growth of a counter. A counter that has gone back was restarted or lost a device, and its
+// growth is unknown.
 std::optional<double> growth(std::uint64_t now, std::uint64_t before) {
   if (now < before) return std::nullopt;
   return static_cast<double>(now - before);
@@ -179,7 +179,7 @@ class Collector {
     ++count_;
   }
 
-  /// Keeps the readings that wait, but for the last, which the next one is compared with.
+  /// Writes the waiting readings, except for the last, with which the next one is compared.
   Status keep() {
     auto batch = context_.linuxPlatform().store().beginBatch();
     if (!batch) return batch.error();
@@ -227,7 +227,7 @@ class Collector {
       case Keeping::Latest:
         return batch.setScalar(now.day, key, saturatingInt64(value));
       case Keeping::Sum: {
-        // What is less than one stays for the next time.
+        // A remainder below one stays for the next time.
         const double sum = value + fractions_[statistic];
         const double whole = std::floor(sum);
         fractions_[statistic] = sum - whole;
@@ -247,7 +247,7 @@ class Collector {
   bool told_[std::size(kStatistics)] = {};
 };
 
-// Holds SIGINT and SIGTERM back while it lives, so that what was sampled is kept when they come.
+// Holds SIGINT and SIGTERM back while it lives, so that samples are kept when they arrive.
 class EndSignals {
  public:
   EndSignals() {
@@ -257,7 +257,7 @@ class EndSignals {
     pthread_sigmask(SIG_BLOCK, &signals_, &before_);
   }
   ~EndSignals() {
-    // One that came meanwhile asked for the end that this is.
+    // A signal that has arrived meanwhile asked for this end.
     while (arriveBefore(Ticks())) {
     }
     pthread_sigmask(SIG_SETMASK, &before_, nullptr);
@@ -265,7 +265,7 @@ class EndSignals {
   EndSignals(const EndSignals&) = delete;
   EndSignals& operator=(const EndSignals&) = delete;
 
-  /// Waits until `end`; true at once when one of the signals has come.
+  /// Waits until `end`; true at once when one of the signals has arrived.
   bool arriveBefore(Ticks end) const {
     for (;;) {
       const auto left = std::max(end - std::chrono::steady_clock::now(), Ticks::duration::zero());
@@ -306,7 +306,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
   context.out() << "kept " << counted(collector.count(), "sample")
                 << " of this machine, taken over " << counted(second, "second") << '\n';
   if (endsEarly) context.note(format("ended by a signal before %u seconds were over", seconds));
-  // One reading alone tells of no rates; that need not be said.
+  // One reading alone gives no rates, which needs no message.
   if (const std::string keys = collector.missing(); collector.count() > 1 && !keys.empty()) {
     context.note("not recorded, as the machine did not tell in this time:" + keys);
   }

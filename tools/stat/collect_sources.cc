@@ -170,7 +170,7 @@ std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
 }
 
 void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
-  // The folder may not have been made yet; then it will be on the file system of the one above.
+  // The folder may not exist yet; it will then be on the file system of the one above.
   std::filesystem::path folder = root.path("/var/mobile");
   struct statvfs status;
   while (statvfs(folder.c_str(), &status) != 0) {

@@ -12,10 +12,10 @@
 namespace tavrel {
 namespace {
 
-// What stands beside the key: kind, day, numbers and tabs.
+// Everything but the key: kind, day, numbers and tabs.
 constexpr std::size_t kLongestLine = limits::kStoreKeyBytes + 4096;
 
-// A long text would bury what the message says of it.
+// A long text would bury the rest of the message.
 std::string_view shortened(std::string_view text) {
   return text.substr(0, 60);
 }

@@ -20,7 +20,7 @@ constexpr std::uint64_t kInfinity = 0x7FF0000000000000;
 constexpr std::uint64_t kQuietPayload = (std::uint64_t{1} << 51) - 1;
 
 // The not-a-number that "nan" or "nan(BITS)" after the sign stands for; nothing for another text.
-// Bits that are no number are as good as none, as they are for strtod.
+// Bits that are not a number count as none, as for strtod.
 std::optional<double> parseNan(std::string_view text) {
   const bool negative = text.starts_with('-');
   if (negative || text.starts_with('+')) text.remove_prefix(1);

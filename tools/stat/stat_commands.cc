@@ -49,7 +49,7 @@ void change(ToolContext& context, Change change) {
   if (!done) context.fail(done.error().message);
 }
 
-// A key that the export could not give back is a slip. False after having said so.
+// A key that the export could not write is a mistake. False after a message that says so.
 bool checkKey(ToolContext& context, const std::string& key) {
   if (isExportable(key)) return true;
   context.failUsage(format("not a key: %s: give UTF-8 text without tabs and line ends",
@@ -91,7 +91,7 @@ void record(ToolContext& context, const Arguments& arguments) {
   });
 }
 
-// A day from the command line. False when it is none, which has been said.
+// A day from the command line. False, after a message, when it is not one.
 bool parseDayOption(ToolContext& context, const std::string& text,
                     std::optional<std::int32_t>& day) {
   if (text.empty()) return true;

@@ -69,7 +69,7 @@ void importStream(ToolContext& context, std::istream& in, const std::string& nam
   }
 }
 
-// Collects lines and hands them on in large pieces.
+// Collects lines and passes them on in large pieces.
 class LineWriter {
  public:
   explicit LineWriter(std::ostream& out) : out_(out) {}

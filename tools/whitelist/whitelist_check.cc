@@ -18,7 +18,7 @@ namespace {
 constexpr std::string_view kTableNames =
     "ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes";
 
-// Bytes of one name in a finding's path; a file may repeat a name of a megabyte a thousand times.
+// Bytes of one name in a finding's path; a file may repeat a name of a megabyte many times.
 constexpr std::size_t kShownNameBytes = 200;
 
 constexpr WhitelistTable kTables[] = {WhitelistTable::ScalarKeys, WhitelistTable::ScalarPrefixes,
@@ -62,7 +62,7 @@ class Findings {
   std::size_t surplus_ = 0;
 };
 
-/// Collects findings under the path of the place that is looked at.
+/// Collects findings under the path of the current place.
 class Checker {
  public:
   explicit Checker(Findings& findings) : findings_(findings) {}
@@ -204,7 +204,7 @@ class Checker {
   Findings& findings_;
 };
 
-/// The place of a rule as findings name it.
+/// The place of a rule, in the form that findings use.
 std::string pathOf(WhitelistTable table, const WhitelistRule& rule) {
   return format("%s/%s/%s", shownName(rule.group), nameOf(table), shownName(rule.key));
 }
@@ -222,7 +222,7 @@ void findRivals(WhitelistTable table, const std::vector<WhitelistRule>& rules, F
   }
 }
 
-// In sorted order a prefix stands right behind those that it begins with; the stack holds them.
+// In sorted order a prefix directly follows those that it begins with; the stack holds them.
 void findHiddenPrefixes(WhitelistTable table, const std::vector<WhitelistRule>& rules,
                         Findings& findings) {
   std::vector<const WhitelistRule*> sorted;
