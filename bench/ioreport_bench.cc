@@ -172,7 +172,7 @@ void delta(benchmark::State& state) {
   countChannels(state);
 }
 
-// Every channel is searched for: the others stand in the reverse order, or are not there at all.
+// Each channel needs a search: the others are in reverse order, or missing.
 void deltaOfOtherOrder(benchmark::State& state) {
   Machine machine(state.range(0));
   const Dictionary samples = IOReportCreateSamplesRaw(machine.channels(0), machine.buffer, nullptr);

@@ -1,4 +1,4 @@
-// Property-list encodings at several sizes. Reading XML stands beside a bare parse of the same
+// Property-list encodings at several sizes. Reading XML is shown next to a bare parse of the same
 // bytes: compare bytes_per_second of the two.
 #include <benchmark/benchmark.h>
 #include <expat.h>

@@ -49,7 +49,7 @@ void parse(benchmark::State& state, const Bytes& bytes, std::int64_t values) {
   if (values > 0) state.SetItemsProcessed(state.iterations() * values);
 }
 
-/// Records that are passed over, of so many values each.
+/// Records that are skipped, of so many values each.
 void statisticsSkipped(benchmark::State& state) {
   Bytes bytes;
   while (bytes.size() < 1U << 20)

@@ -91,7 +91,7 @@ void walk(benchmark::State& state, const Bytes& items) {
   state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(items.size()));
 }
 
-// Items of a payload of that many bytes, all of them passed over.
+// Items of a payload of that many bytes, all of them skipped.
 void freezerPassedOver(benchmark::State& state) {
   Bytes items;
   appendItem(items, 0x13, 1, 4);

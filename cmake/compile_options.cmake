@@ -8,13 +8,13 @@ target_compile_options(tavrel_options INTERFACE
   -Wcast-align -Wold-style-cast -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
   -ffp-contract=off -fno-math-errno)
 
-# When it optimises, GCC 12 sees overlapping copies inside std::string, and numbers taken for
-# pointers where a value is destroyed, that are none. The other builds look for both.
+# With optimisation, GCC 12 wrongly warns of overlapping copies inside std::string, and of numbers
+# used as pointers where a value is destroyed. The other builds have both warnings.
 target_compile_options(tavrel_options INTERFACE
   $<$<AND:$<CXX_COMPILER_ID:GNU>,$<CONFIG:Release>>:-Wno-restrict;-Wno-array-bounds>)
 
 if(TAVREL_SANITIZE)
-  # The sanitizers' own code makes GCC see uninitialised reads that are none.
+  # With the sanitizers' own code, GCC wrongly warns of uninitialised reads.
   target_compile_options(tavrel_options INTERFACE
     -fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer
     $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)

@@ -23,7 +23,8 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-/// Adds a boundary to the list and what it compares as; what is no number stops no value.
+/// Adds a boundary to the list, with the number as which it compares; a boundary that is not a
+/// number stops no value.
 void addBoundary(unsigned kind, std::uint64_t bits, plist::Array& list,
                  std::vector<double>& numbers) {
   constexpr double kNone = std::numeric_limits<double>::quiet_NaN();

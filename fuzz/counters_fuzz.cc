@@ -61,7 +61,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   TelemetryCounters counters, again;
   again.elements.fill(0xFFFFFFFF);
   parse(block, counters);
-  // Words behind 532 are never read.
+  // Words after 532 are never read.
   std::fill(block.begin() + 533 * 4, block.end(), std::byte{0xA5});
   parse(block, again);
   require(counters == again);

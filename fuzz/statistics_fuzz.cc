@@ -57,7 +57,7 @@ void check(const ASPContext& context, const std::vector<std::uint64_t>& expected
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  // A copy of exactly that size, so that a read behind the end is seen.
+  // A copy of exactly that size, so that a read beyond the end shows.
   const auto copy = std::make_unique<std::byte[]>(size);
   if (size > 0) std::memcpy(copy.get(), data, size);
   const ByteSpan buffer(copy.get(), size);

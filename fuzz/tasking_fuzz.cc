@@ -1,6 +1,6 @@
 // Tasking payloads of any content. One run applies what the payload says and nothing else, a second
 // changes nothing, and a run with another tasking takes the settings back and leaves the rest; each
-// domain is synchronised once, the daemon's own behind all others.
+// domain is synchronised once, the daemon's own last.
 #include <cstdlib>
 #include <map>
 #include <set>
@@ -98,7 +98,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   }
   require(others(fake) == expected);
 
-  // Without settings nothing is remembered, and the tasking is told of as new each time.
+  // Without settings nothing is remembered, and the tasking counts as new each time.
   require(track(fake).empty() && fake.journal.size() == (settings ? 0 : 1));
 
   schedule(fake, {{kTaskingIDKey, "two"}});

@@ -1,7 +1,7 @@
 // The whole client of the kernel's reporting facility. Drivers publish channels: counters, arrays
 // of them, histograms and times spent in states. Read the headers in this order:
 //
-//   error_object.h   how failures are told
+//   error_object.h   how failures are reported
 //   channel.h        one channel, and who and what it is
 //   aggregate.h      a collection of channels
 //   discovery.h      the channels that drivers publish

@@ -10,8 +10,8 @@
 //
 // What is written reads back equal, except for what XML cannot hold:
 //   - control characters (other than tab, line feed and carriage return), U+FFFE, U+FFFF and
-//     malformed UTF-8 become U+FFFD. Keys that become equal by that are told apart by a number
-//     behind the later ones: "a\x01", "a\x02" are written as "a\uFFFD", "a\uFFFD2";
+//     malformed UTF-8 become U+FFFD. The later of keys that become equal get a number: "a\x01",
+//     "a\x02" are written as "a\uFFFD", "a\uFFFD2";
 //   - a date loses its fraction of a second (it is rounded down);
 //   - a float is read as the double of the same value, an integer as a 64-bit one.
 #pragma once

@@ -196,7 +196,7 @@ struct FakeSystemVersion : SystemVersion {
   plist::Dictionary systemVersionDictionary() override { return version; }
 };
 
-/// Plays a list of events; every slice behind them runs out of time.
+/// Plays a list of events; every slice after them runs out of time.
 struct FakeEventLoop : EventLoop {
   std::deque<std::function<void()>> events;
   bool terminates = false;

@@ -108,7 +108,7 @@ class View {
  private:
   using Values = std::map<std::string_view, plist::Value>;
   struct Bucket {
-    std::uint64_t number;  // behind the stem
+    std::uint64_t number;  // after the stem
     std::uint64_t count;
   };
   using Buckets = std::map<std::string_view, Bucket>;  // by key
