@@ -11,6 +11,9 @@ inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
 /// Integer: the last day that the gated run has done.
 inline constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
+/// String: how the log of that run came out, a name of report/log_outcome.h.
+inline constexpr std::string_view kLastLogOutcomeKey = "LastLogOutcome";
+
 /// String: the OS version at the last log.
 inline constexpr std::string_view kLastOSVersionKey = "LastOSVersion";
 

@@ -1,22 +1,11 @@
 #include "daemon/app_info.h"
 
 #include <algorithm>
-#include <optional>
-#include <string>
 
 #include "base/uuid.h"
 
 namespace tavrel {
 namespace {
-
-std::optional<std::string> uuidFrom(const plist::Value& value) {
-  if (const auto text = value.string()) return normalisedUuid(*text);
-  const plist::Data data = value.data();
-  UuidBytes bytes;
-  if (data.size() != bytes.size()) return std::nullopt;
-  std::ranges::copy(data.bytes(), bytes.begin());
-  return uuidText(bytes);
-}
 
 std::int64_t numberOrZero(const plist::Dictionary& from, std::string_view key) {
   const auto number = from.number(key);
@@ -25,13 +14,22 @@ std::int64_t numberOrZero(const plist::Dictionary& from, std::string_view key) {
 
 }  // namespace
 
+std::optional<std::string> appUuidFrom(const plist::Value& value) {
+  if (const auto text = value.string()) return normalisedUuid(*text);
+  const plist::Data data = value.data();
+  UuidBytes bytes;
+  if (data.size() != bytes.size()) return std::nullopt;
+  std::ranges::copy(data.bytes(), bytes.begin());
+  return uuidText(bytes);
+}
+
 plist::Array appInfoFrom(const plist::Array& appData) {
   plist::Array entries = plist::Array::create(appData.size());
   for (const plist::Value& element : appData) {
     const plist::Dictionary app = element.dictionary();
     const auto bundle = app.string("bundle_id");
     const auto version = app.string("version");
-    const auto uuid = uuidFrom(app.get("uuid"));
+    const auto uuid = appUuidFrom(app.get("uuid"));
     if (!bundle || !version || !uuid) continue;
     entries.append(plist::Dictionary{{"bundle", app.get("bundle_id")},
                                      {"version", app.get("version")},

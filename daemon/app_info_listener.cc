@@ -9,8 +9,6 @@
 namespace tavrel {
 namespace {
 
-enum Operation : std::int32_t { kAnnounce = 0, kForceDay = 1, kDeliver = 2 };
-
 void deliver(Platform& platform, const plist::Array& appData) {
   bool& requested = platform.state->appInfoRequested;
   const plist::Array appInfo = appInfoFrom(appData);
@@ -40,16 +38,20 @@ void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
   const plist::Dictionary message = event.dictionary();
   const auto operation = integerIn(message, "operation");
   if (!operation) return;
-  if (*operation == kDeliver) {
+  if (*operation == kDeliverAppInfo) {
     if (const auto appData = message.array("app_data")) deliver(platform, appData);
     return;
   }
   const auto day = integerIn(message, "value");
   if (*operation == kForceDay && !day) return;
-  if (platform.state->clientRequestHandled) return;
+  if (platform.state->clientRequestHandled) {
+    platform.log->log(LogLevel::Debug, "ignored operation %d: this process has had its one request",
+                      *operation);
+    return;
+  }
   platform.state->clientRequestHandled = true;
   switch (*operation) {
-    case kAnnounce:
+    case kAnnounceAppInfo:
       announce(platform);
       break;
     case kForceDay:

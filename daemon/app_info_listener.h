@@ -1,11 +1,11 @@
 // The service through which clients trigger the daily run and deliver the list of activated
 // applications.
 //
-// A message is a dictionary with a number "operation": 0 announces app information, 1 forces the
-// tasks of the day "value", 2 delivers the information in "app_data". A message that lacks what its
-// operation needs is ignored. The service answers no message.
+// A message is a dictionary with a number "operation". One that lacks what its operation needs is
+// ignored. Nothing is ever answered.
 #pragma once
 
+#include <cstdint>
 #include <memory>
 #include <string_view>
 
@@ -17,11 +17,18 @@ namespace tavrel {
 inline constexpr std::string_view kAppInfoServiceName = kTavrelDomain;
 inline constexpr std::string_view kLoggingNotification = "com.norvane.tallied.tavrel.logging";
 
-/// Starts listening; the event loop handles events while it runs. Releasing the listener ends the
-/// service. Null when the service cannot be made. The platform must outlive it.
+/// The operations of a message.
+inline constexpr std::int32_t kAnnounceAppInfo = 0;
+inline constexpr std::int32_t kForceDay = 1;        // the tasks of the day "value"
+inline constexpr std::int32_t kDeliverAppInfo = 2;  // the information in "app_data"
+
+/// Starts to listen; events are handled while the event loop runs. The service ends when the
+/// listener is released. Null when the service cannot be had. The platform must outlive it.
 std::unique_ptr<ServiceListener> startAppInfoListener(Platform& platform);
 
-/// Handles one event of a peer; ignores anything but a message.
+/// Handles one event of a peer; what is no message is ignored. The first message of the process
+/// with an operation other than 2, known or not, fires a guard: later ones are ignored with a debug
+/// line.
 void handleAppInfoMessage(Platform& platform, const plist::Value& event);
 
 }  // namespace tavrel

@@ -1,5 +1,7 @@
 #include "daemon/daily_run.h"
 
+#include <string>
+
 #include "base/arithmetic.h"
 #include "config/persisted_state.h"
 #include "daemon/tasking.h"
@@ -16,62 +18,84 @@ struct DailyWork {
   std::int32_t day;
   const plist::Array& appInfo;
   const StepObserver& onStep;
+  LogOutcome logOutcome = LogOutcome::NotFiled;  // until the report has come to its end
 };
+
+void report(DailyWork& work) {
+  Platform& platform = work.platform;
+  work.logOutcome = platform.submission->isDiagnosticSubmissionEnabled()
+                        ? BHReport(platform).writeLogForYesterday(work.day, work.appInfo)
+                        : LogOutcome::NotPermitted;
+  // A log that could not be filed has its error already.
+  if (work.logOutcome == LogOutcome::Filed || work.logOutcome == LogOutcome::NotFiled) return;
+  platform.log->write(LogLevel::Info, logOutcomeText(work.logOutcome, std::to_string(work.day)));
+}
 
 struct DailyTask {
   const char* name;
   const char* purpose;  // completes "cannot ..." when an exception ends the task
-  void (*run)(const DailyWork& work);
+  void (*run)(DailyWork& work);
 };
 
 constexpr DailyTask kDailyTasks[] = {
     {"Checkpoint of the statistics store", "checkpoint the store",
-     [](const DailyWork& work) { work.platform.statistics->BHClientCheckpoint(); }},
-    {"Report", "finish the daily log",
-     [](const DailyWork& work) {
-       if (work.platform.submission->isDiagnosticSubmissionEnabled()) {
-         BHReport(work.platform).writeLogForYesterday(work.day, work.appInfo);
-       }
-     }},
+     [](DailyWork& work) { work.platform.statistics->BHClientCheckpoint(); }},
+    {"Report", "finish the daily log", report},
     {"Storage statistics", "finish the storage statistics",
-     [](const DailyWork& work) { dailyStorageStatistics(work.platform, work.onStep); }},
+     [](DailyWork& work) { dailyStorageStatistics(work.platform, work.onStep); }},
     {"Clean-up of structured records", "clean up structured records",
-     [](const DailyWork& work) { work.platform.crashReporting->FLDumpAllOldStructuredDataLogs(); }},
+     [](DailyWork& work) { work.platform.crashReporting->FLDumpAllOldStructuredDataLogs(); }},
     {"Changes of the system, and tasking", "finish tracking OS updates and tasking",
-     [](const DailyWork& work) { trackOSChangeAndTasking(work.platform); }},
+     [](DailyWork& work) { trackOSChangeAndTasking(work.platform); }},
     {"Roll-over of the support log", "roll the support log",
-     [](const DailyWork& work) { work.platform.crashReporting->rollNorvaneCareLogs(); }},
+     [](DailyWork& work) { work.platform.crashReporting->rollNorvaneCareLogs(); }},
 };
+
+/// A longer gap between two runs is a clock that was set, not days of use.
+constexpr std::int64_t kLongestGapDays = 3660;
+
+void noteDaysPassedOver(SystemLog& log, std::int64_t lastRunDay, std::int32_t yesterday) {
+  const std::int64_t sinceRun = wrappingSubtract(yesterday, lastRunDay);
+  if (sinceRun <= 1 || sinceRun > kLongestGapDays) return;
+  log.log(LogLevel::Info, "days without a run that will not be reported: %lld (%lld to %d)",
+          sinceRun - 1, lastRunDay + 1, previousDay(yesterday));
+}
 
 }  // namespace
 
-void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo, const StepObserver& onStep) {
+std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Array& appInfo,
+                                           const StepObserver& onStep) {
   beginStep(onStep, "Once-a-day gate");
   const std::int32_t yesterday = previousDay(platform.statistics->BHDaysSince1970());
-  const std::int32_t lastRunDay =
-      lowInt32(platform.preferences->ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain));
-  if (lastRunDay >= yesterday) {
+  bool hasRun = false;
+  const std::int64_t lastRunDay =
+      platform.preferences->ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
+  if (lowInt32(lastRunDay) >= yesterday) {
     platform.log->log(LogLevel::Default, "Day unchanged since last run");
-    return;
+    return std::nullopt;
   }
-  dailyTasksForDay(platform, yesterday, appInfo, onStep);
+  if (hasRun) noteDaysPassedOver(platform.log, lastRunDay, yesterday);
+  const LogOutcome outcome = dailyTasksForDay(platform, yesterday, appInfo, onStep);
   beginStep(onStep, "End of the gated run");
   // A kill must not lose what the tasks have set once the day counts as done.
   runGuarded(platform.log, "checkpoint the store after the tasks",
              [&] { platform.statistics->BHClientCheckpoint(); });
+  rememberLogOutcome(platform.preferences, outcome);
   platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);
+  return outcome;
 }
 
-void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
-                      const StepObserver& onStep) {
-  const DailyWork work{platform, day, appInfo, onStep};
+LogOutcome dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
+                            const StepObserver& onStep) {
+  DailyWork work{platform, day, appInfo, onStep};
   beginStep(onStep, "Daily tasks");
   platform.log->log(LogLevel::Default, "daily tasks for day %d", day);
   for (const DailyTask& task : kDailyTasks) {
     beginStep(onStep, task.name);
     runGuarded(platform.log, task.purpose, [&] { task.run(work); });
   }
+  return work.logOutcome;
 }
 
 }  // namespace tavrel

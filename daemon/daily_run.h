@@ -2,22 +2,24 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 
 #include "base/plist.h"
 #include "platform/platform.h"
 #include "platform/step_observer.h"
+#include "report/log_outcome.h"
 
 namespace tavrel {
 
-/// The gated run: does yesterday's tasks unless they were done before, and remembers the day.
-/// `appInfo` is the list of activated applications, an empty handle when there is none. Calls
-/// `onStep` for the gate, for each task, and for the end.
-void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo,
-                      const StepObserver& onStep = {});
+/// The gated run: does yesterday's tasks unless they are done, and remembers the day. `appInfo` is
+/// the list of activated applications, an empty handle when there is none. `onStep` hears of the
+/// gate, of each task, and of the end. Yields how the log came out, nothing when the day was done.
+std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Array& appInfo,
+                                           const StepObserver& onStep = {});
 
-/// The tasks for one day, without the gate. A task that fails, even with an exception, does not
-/// stop the ones after it.
-void dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
-                      const StepObserver& onStep = {});
+/// The tasks for one day, without the gate. No task's failure, not even an exception, stops the
+/// ones after it. Yields how the log came out, which an info line says when there is none.
+LogOutcome dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
+                            const StepObserver& onStep = {});
 
 }  // namespace tavrel

@@ -4,12 +4,30 @@
 #include <string_view>
 
 #include "base/arithmetic.h"
+#include "base/format.h"
+#include "base/version.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/daily_run.h"
 #include "platform/guarded.h"
 
 namespace tavrel {
 namespace {
+
+constexpr std::string_view kHelp =
+    "Usage: tavrel [-d | -f | -t]\n"
+    "\n"
+    "Reports a device's usage statistics once a day.\n"
+    "\n"
+    "  (none)      Serve clients until 10 seconds have passed without an event\n"
+    "  -d          Do the daily tasks for yesterday, unless they have been done\n"
+    "  -f          Do the daily tasks for yesterday, done or not\n"
+    "  -t          Do the daily tasks for today\n"
+    "  -h, --help  Print this help\n"
+    "  --version   Print the version\n"
+    "\n"
+    "TAVREL_ROOT in the environment names the folder that holds the device's files\n"
+    "(default: /). The exit status is always 0. See tavrel(8), and tavrelctl(1) for\n"
+    "a look at the device.\n";
 
 // True when the wait ended because nothing happened, false when the system ended it.
 bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {
@@ -47,6 +65,10 @@ void runArgument(Platform& platform, const char* argument) {
     dailyTasksForDay(platform, today, noAppInfo);
   } else {
     platform.log->log(LogLevel::Default, "Unknown arg: %s", argument);
+    if (mode == "-h" || mode == "--help") platform.standardStreams->writeOutput(kHelp);
+    if (mode == "--version") {
+      platform.standardStreams->writeOutput(format("tavrel %s\n", version()));
+    }
   }
 }
 

@@ -13,7 +13,8 @@ inline constexpr std::chrono::milliseconds kIdleSlice{10'000};
 
 /// Runs the process. `arguments` begins with the program's name. Without an argument it serves
 /// clients until one slice has passed without an event; "-d" is the gated daily run, "-f" and
-/// "-t" force the tasks of yesterday and today. The exit status is always 0.
+/// "-t" force the tasks of yesterday and today. "-h", "--help" and "--version" print on standard
+/// output. The exit status is always 0.
 int runTavrel(Platform& platform, std::span<const char* const> arguments,
               std::chrono::milliseconds idleSlice = kIdleSlice);
 

@@ -4,6 +4,7 @@
 #include <fcntl.h>
 #include <span>
 #include <unistd.h>
+#include <utility>
 
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
@@ -28,7 +29,13 @@ int main(int argc, char** argv) {
   using namespace tavrel;
   secureStandardStreams();
   try {
-    LinuxPlatform linuxPlatform(DeviceRoot::fromEnvironment());
+    DeviceRoot root = DeviceRoot::fromEnvironment();
+    if (const Status usable = root.check(); !usable) {
+      LinuxSystemLog().log(LogLevel::Error, "%s: name the device's folder with TAVREL_ROOT",
+                           usable.error().message);
+      return 0;
+    }
+    LinuxPlatform linuxPlatform(std::move(root));
     return runTavrel(linuxPlatform.platform(),
                      std::span<const char* const>(argv, static_cast<std::size_t>(argc)));
   } catch (const std::exception& error) {

@@ -47,12 +47,59 @@ void forEachSetting(const plist::Array& payload, Visit visit) {
   }
 }
 
+plist::Value ownPreference(Platform& platform, std::string_view key) {
+  return platform.preferences->ZTXPreferencesGetValue(key, kTavrelDomain);
+}
+
+/// Null when it is not known.
+plist::Value systemBuild(Platform& platform) {
+  return platform.systemVersion->systemVersionDictionary().get(kProductBuildVersionKey);
+}
+
+/// The scheduled tasking beside the applied one.
+struct TaskingPlan {
+  TaskingPlan(Platform& platform, const plist::Value& build)
+      : scheduled(
+            platform.preferences->ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)
+                .dictionary()) {
+    if (!isScheduled()) return;
+    appliedID = ownPreference(platform, kTaskingIDKey);
+    appliedOS = ownPreference(platform, kTaskingOSKey);
+    if (appliedID == scheduled.get(kTaskingIDKey) && appliedOS == build) return;
+    refusal = whyNotRemembered(platform.propertyLists);
+    change = !refusal.empty() ? TaskingChange::Refuse
+             : appliedID      ? TaskingChange::Replace
+                              : TaskingChange::Apply;
+  }
+
+  bool isScheduled() const { return scheduled.string(kTaskingIDKey).has_value(); }
+
+  plist::Dictionary scheduled;
+  plist::Value appliedID;
+  plist::Value appliedOS;
+  TaskingChange change = TaskingChange::None;
+  std::string refusal;
+
+ private:
+  /// Empty when it can be. Settings that are applied and not remembered could never be undone.
+  std::string whyNotRemembered(PropertyListCoding& propertyLists) const {
+    if (!scheduled.array(kTaskingPayloadKey)) return {};  // nothing is
+    auto kept = plist::Dictionary::create();
+    for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey})
+      kept.set(key, scheduled.get(key));
+    const auto xml = propertyLists.encodeXml(kept);
+    if (!xml) return xml.error().message;
+    if (xml->size() <= Preferences::kLargestChange) return {};
+    return format("it needs %zu bytes and may have %zu", xml->size(), Preferences::kLargestChange);
+  }
+};
+
 class Tracker {
  public:
   explicit Tracker(Platform& platform)
       : platform_(platform),
         today_(platform.statistics->BHDaysSince1970()),
-        build_(platform.systemVersion->systemVersionDictionary().get(kProductBuildVersionKey)),
+        build_(systemBuild(platform)),
         lastUpdate_(own(kLastOSUpdateKey).dictionary()) {}
 
   void trackOSChange() {
@@ -66,25 +113,23 @@ class Tracker {
 
   /// False when no tasking is scheduled.
   bool trackTasking() {
-    const plist::Dictionary scheduled =
-        platform_.preferences->ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain)
-            .dictionary();
-    if (!scheduled.string(kTaskingIDKey)) return false;
-
-    const plist::Value newID = scheduled.get(kTaskingIDKey);
-    const plist::Value appliedID = own(kTaskingIDKey);
-    const plist::Value appliedOS = own(kTaskingOSKey);
-    if (appliedID == newID && appliedOS == build_) return true;
-
-    if (!canBeRemembered(scheduled)) return true;
+    const TaskingPlan plan(platform_, build_);
+    if (!plan.isScheduled()) return false;
+    if (plan.change == TaskingChange::None) return true;
+    if (plan.change == TaskingChange::Refuse) {
+      platform_.log->log(LogLevel::Error,
+                         "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
+                         kScheduledTaskingKey, kScheduleDomain, plan.refusal);
+      return true;
+    }
     PreferenceWriter writer(platform_.preferences);
-    if (appliedID) {
+    if (plan.change == TaskingChange::Replace) {
       platform_.log->log(LogLevel::Default,
                          "Tasking update (%{public}@ -> %{public}@, %{public}@ -> %{public}@)",
-                         appliedID, newID, appliedOS, build_);
+                         plan.appliedID, plan.scheduled.get(kTaskingIDKey), plan.appliedOS, build_);
       undo(writer);
     }
-    apply(scheduled, writer);
+    apply(plan.scheduled, writer);
     writer.synchronize();
     platform_.notifications->post(kTaskingChanged);
     return true;
@@ -104,27 +149,7 @@ class Tracker {
   }
 
  private:
-  plist::Value own(std::string_view key) {
-    return platform_.preferences->ZTXPreferencesGetValue(key, kTavrelDomain);
-  }
-
-  /// Logs an error when it cannot. Settings that are applied and not remembered could never be
-  /// undone.
-  bool canBeRemembered(const plist::Dictionary& scheduled) {
-    if (!scheduled.array(kTaskingPayloadKey)) return true;  // nothing is
-    auto kept = plist::Dictionary::create();
-    for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey})
-      kept.set(key, scheduled.get(key));
-    const auto xml = platform_.propertyLists->encodeXml(kept);
-    if (xml && xml->size() <= Preferences::kLargestChange) return true;
-    platform_.log->log(LogLevel::Error,
-                       "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
-                       kScheduledTaskingKey, kScheduleDomain,
-                       xml ? format("it needs %zu bytes and may have %zu", xml->size(),
-                                    Preferences::kLargestChange)
-                           : xml.error().message);
-    return false;
-  }
+  plist::Value own(std::string_view key) { return ownPreference(platform_, key); }
 
   void undo(PreferenceWriter& writer) {
     forEachSetting(own(kTaskingPayloadKey).array(),
@@ -150,11 +175,15 @@ class Tracker {
 
   Platform& platform_;
   const std::int32_t today_;
-  const plist::Value build_;  // null when it is not known
+  const plist::Value build_;
   plist::Dictionary lastUpdate_;
 };
 
 }  // namespace
+
+TaskingChange nextTaskingChange(Platform& platform) {
+  return TaskingPlan(platform, systemBuild(platform)).change;
+}
 
 void trackOSChangeAndTasking(Platform& platform) {
   Tracker tracker(platform);

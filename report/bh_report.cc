@@ -6,10 +6,10 @@ namespace tavrel {
 
 BHReport::BHReport(Platform& platform) : platform_(platform), _config(BHConfig::init(platform)) {}
 
-void BHReport::writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo) {
+LogOutcome BHReport::writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo) {
   platform_.log->log(LogLevel::Info, "writing tallied log. yesterday=%d", day);
   collect(day);
-  serializeWithDate(day, withAppInfo);
+  return serializeWithDate(day, withAppInfo);
 }
 
 void BHReport::collect(std::int32_t day) {

@@ -15,6 +15,7 @@
 #include "base/plist.h"
 #include "config/bh_config.h"
 #include "platform/platform.h"
+#include "report/log_outcome.h"
 
 namespace tavrel {
 
@@ -29,11 +30,11 @@ class BHReport {
 
   /// Collects the statistics of a day and serialises them. `withAppInfo` is the list of activated
   /// applications, an empty handle when the caller has none.
-  void writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo);
+  LogOutcome writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo);
 
-  /// Adds the probes to what was collected, builds the log and submits it. Does nothing when
-  /// nothing was collected.
-  void serializeWithDate(std::int32_t day, const plist::Array& andAppInfo);
+  /// Adds the probes to what was collected, builds the log and submits it. A report in which
+  /// nothing was collected does nothing.
+  LogOutcome serializeWithDate(std::int32_t day, const plist::Array& andAppInfo);
 
   // Scalars.
 

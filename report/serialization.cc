@@ -25,8 +25,10 @@ plist::Value orDefault(plist::Value value, plist::Value fallback) {
 
 }  // namespace
 
-void BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInfo) {
-  if (_scalarsOutput.empty() && _distributionsOutput.empty() && _histogramsOutput.empty()) return;
+LogOutcome BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInfo) {
+  if (_scalarsOutput.empty() && _distributionsOutput.empty() && _histogramsOutput.empty()) {
+    return _config ? LogOutcome::NothingToReport : LogOutcome::NoWhitelist;
+  }
 
   addInstalledAppInfo();
   addMetadataKeys();
@@ -42,13 +44,15 @@ void BHReport::serializeWithDate(std::int32_t day, const plist::Array& andAppInf
   if (!encoded) {
     platform_.log->log(LogLevel::Error, "Could not create tallied plist: %@",
                        encoded.error().message);
-    return;
+    return LogOutcome::NotFiled;
   }
 
   const bool submitted = platform_.submission->ZTXWriteLogForSubmission(
       kTalliedLogType, kTalliedLogName, submissionOptions(),
       [&](LogFile& file) { file.write(asBytes(*encoded)); });
-  if (!submitted) platform_.log->log(LogLevel::Error, "Failed to write tallied log");
+  if (submitted) return LogOutcome::Filed;
+  platform_.log->log(LogLevel::Error, "Failed to write tallied log");
+  return LogOutcome::NotFiled;
 }
 
 plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& appInfo,

@@ -5,6 +5,7 @@
 #include <ostream>
 
 #include "base/format.h"
+#include "base/version.h"
 #include "tools/device/prefs_commands.h"
 #include "tools/device/send_commands.h"
 #include "tools/device/status_command.h"
@@ -45,7 +46,7 @@ void addGlobalOptions(CLI::App& app, ToolContext& context) {
   app.fallthrough();
   app.require_subcommand(1);
   app.footer("--root DIR may stand anywhere on the line. See tavrelctl(1).");
-  app.set_version_flag("--version", "tavrelctl " TAVREL_VERSION);
+  app.set_version_flag("--version", "tavrelctl " + std::string(version()));
   app.add_option_function<std::string>(
          "--root",
          [&context](const std::string& folder) {

@@ -19,12 +19,12 @@
 #include "platform/linux/process/linux_clock.h"
 #include "platform/linux/process/linux_event_loop.h"
 #include "platform/linux/process/linux_process.h"
-#include "platform/linux/process/linux_standard_streams.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recorded_snapshots.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/socket_service.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/linux/system_log/linux_standard_streams.h"
 #include "platform/linux/system_log/linux_system_log.h"
 #include "platform/plist/coding.h"
 
@@ -67,7 +67,7 @@ struct LinuxPlatform::Services {
   SocketServices namedServices{eventLoop, root, log};
   LinuxDateFormatting dateFormatting{root};
   LinuxProcess process;
-  LinuxStandardStreams standardStreams;
+  LinuxStandardStreams standardStreams{systemLog};
   RecordedRegistry drivers{root, fileSystem, propertyLists, log};
   RecordedSnapshots stackSnapshots{root, fileSystem, log};
   ProcessState state;

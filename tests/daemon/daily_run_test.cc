@@ -1,8 +1,10 @@
 #include "daemon/daily_run.h"
 
+#include <algorithm>
 #include <gtest/gtest.h>
 #include <limits>
 
+#include "base/version.h"
 #include "config/persisted_state.h"
 #include "daemon/entry.h"
 #include "tests/fakes/fake_platform.h"
@@ -15,6 +17,8 @@ using Messages = std::vector<std::string>;
 using std::chrono_literals::operator""ms;
 
 constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
+
+const std::string kNotPermitted = "no log for day 19999: diagnostic submission not allowed";
 
 // What every run says of a device that has no storage to ask.
 const std::string kNoStorage =
@@ -30,6 +34,7 @@ const fakes::Journal kGatedTasks{"checkpoint",
                                  "clean structured logs",
                                  "roll support log",
                                  "checkpoint",
+                                 "set com.norvane.tallied.tavrel LastLogOutcome",
                                  "set com.norvane.tallied.tavrel " + std::string(kDayKey),
                                  "synchronize com.norvane.tallied.tavrel"};
 
@@ -54,7 +59,8 @@ TEST_F(DailyRunTest, RunsOncePerDay) {
   runDailyIfNeeded(fake.platform, {});
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(storedDay(), plist::Value(19999));
-  EXPECT_EQ(fake.log.messages(), (Messages{"daily tasks for day 19999", kNoStorage}));
+  EXPECT_EQ(fake.log.messages(),
+            (Messages{"daily tasks for day 19999", kNotPermitted, kNoStorage}));
 
   fake.journal.clear();
   runDailyIfNeeded(fake.platform, {});
@@ -87,12 +93,67 @@ TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
   }
 }
 
+TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
+  struct Case {
+    plist::Value stored;
+    std::int32_t today;
+    const char* days;  // that are said to be missing
+  };
+  for (const auto& [stored, today, days] :
+       std::vector<Case>{{{}, 20000, ""},
+                         {"19000", 20000, ""},
+                         {19998, 20000, ""},
+                         {19997, 20000, "1 (19998 to 19998)"},
+                         {16339, 20000, "3659 (16340 to 19998)"},
+                         {16338, 20000, ""},
+                         {-3, 2, "3 (-2 to 0)"},
+                         {std::int64_t{1} << 40, 20000, ""},
+                         {std::numeric_limits<std::int64_t>::min(), 20000, ""},
+                         {0, std::numeric_limits<std::int32_t>::min(), ""}}) {
+    fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);
+    fake.store.today = today;
+    fake.log.entries.clear();
+    runDailyIfNeeded(fake.platform, {});
+    Messages info = fake.log.messages(LogLevel::Info);
+    ASSERT_FALSE(info.empty());
+    info.pop_back();  // why there is no log
+    const std::string text = std::string("days without a run that will not be reported: ") + days;
+    EXPECT_EQ(info, *days ? Messages{text} : Messages{}) << textOf(stored) << " on " << today;
+  }
+}
+
+TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
+  const auto run = [this](int day) {
+    fake.store.today = day + 1;
+    fake.log.entries.clear();
+    fake.journal.clear();
+    runDailyIfNeeded(fake.platform, {});
+    return fake.log.messages(LogLevel::Info).back();
+  };
+  const auto outcome = [this] {
+    return fake.preferences.domain(kTavrelDomain).get("LastLogOutcome");
+  };
+  fake.submission.enabled = true;
+  EXPECT_EQ(run(1), "no log for day 1: no usable whitelist");
+  EXPECT_EQ(outcome(), plist::Value("no-whitelist"));
+  fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
+  EXPECT_EQ(run(2), "no log for day 2: no value found for any whitelisted key");
+  run(3);
+  EXPECT_EQ(std::ranges::count(fake.journal, "set com.norvane.tallied.tavrel LastLogOutcome"), 0);
+  fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}};
+  EXPECT_EQ(run(4), "writing tallied log. yesterday=4");
+  EXPECT_EQ(outcome(), plist::Value("filed"));
+  fake.submission.fails = true;
+  EXPECT_EQ(run(5), "writing tallied log. yesterday=5");
+  EXPECT_EQ(outcome(), plist::Value("not-filed"));
+}
+
 TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
   fake.store.scalars = {{"k", 19999, 1}};
   fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
   dailyTasksForDay(fake.platform, 19999, {});
   EXPECT_EQ(fake.journal, kTasks);
-  EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{});  // nor was the whitelist looked at
+  EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{kNotPermitted});
 
   fake.submission.enabled = true;
   fake.journal.clear();
@@ -106,8 +167,8 @@ TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
 TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   run({"tavrel", "-d", "-t"});
   EXPECT_EQ(fake.journal, kGatedTasks);
-  EXPECT_EQ(fake.log.messages(),
-            (Messages{"tavrel started", "daily tasks for day 19999", kNoStorage, "tavrel ended"}));
+  EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "daily tasks for day 19999",
+                                           kNotPermitted, kNoStorage, "tavrel ended"}));
 
   run({"tavrel", "-f"});
   EXPECT_EQ(fake.journal, kTasks);
@@ -120,6 +181,15 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
     EXPECT_EQ(fake.journal, fakes::Journal{});
     EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + unknown);
   }
+  EXPECT_EQ(fake.streams.output, "");
+  for (const char* help : {"-h", "--help"}) {
+    run({"tavrel", help});
+    EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + help);
+    EXPECT_TRUE(fake.streams.output.starts_with("Usage: tavrel [-d | -f | -t]\n\n"));
+    fake.streams.output.clear();
+  }
+  run({"tavrel", "--version"});
+  EXPECT_EQ(fake.streams.output, format("tavrel %s\n", version()));
   run({});
   EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
 }
@@ -155,7 +225,7 @@ TEST_F(DailyRunTest, GoesOnBehindAnException) {
   EXPECT_EQ(fake.log.messages(),
             (Messages{"tavrel started", "cannot go on serving: the message",
                       "never received requested AAI, so moving along without it",
-                      "daily tasks for day 19999",
+                      "daily tasks for day 19999", kNotPermitted,
                       "cannot finish the storage statistics: std::bad_alloc", "tavrel ended"}));
   EXPECT_EQ(fake.journal, kGatedTasks);
 }

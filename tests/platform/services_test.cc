@@ -16,6 +16,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_crash_reporting.h"
 #include "platform/linux/logs/json_line.h"
+#include "platform/linux/system_log/linux_standard_streams.h"
 #include "platform/linux/system_log/linux_system_log.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
@@ -203,6 +204,40 @@ TEST(SystemLog, SpeaksToTheJournalWhenTheStreamIsItsOwn) {
   log.write(LogLevel::Info, std::string(16U << 20, 'x'));
   EXPECT_EQ(received(MSG_DONTWAIT), "");
   EXPECT_EQ(*FileSystem().read(device.root.path("/stream"), 100), "<3>one\n<3>two\n");
+
+  // What the system prints on standard error is an entry at debug level, without its line end.
+  LinuxStandardStreams streams(log);
+  for (const char* text : {"no end", "an end\n"}) {
+    streams.writeError(text);
+    const std::string entry = received(MSG_DONTWAIT);
+    EXPECT_TRUE(entry.starts_with("PRIORITY=7\n")) << entry;
+    EXPECT_TRUE(
+        entry.ends_with(std::string("MESSAGE\n\6\0\0\0\0\0\0\0", 16) + std::string(text, 6) + "\n"))
+        << entry;
+  }
+}
+
+TEST(SystemLog, CutsLongMessagesAboveDebugLevel) {
+  constexpr std::size_t kLongest = LinuxSystemLog::kLongestMessage;
+  const std::string whole = std::string(kLongest - 1, 'a') + "\xC3\xA9" + "z";
+  const TemporaryRoot device;
+  const std::string path = device.root.path("/stream");
+  const Descriptor stream(open(path.c_str(), O_RDWR | O_CREAT, 0600));
+  LinuxSystemLog log(stream.get());
+  log.write(LogLevel::Info, whole.substr(0, kLongest - 1));
+  log.write(LogLevel::Default, whole);
+  log.write(LogLevel::Debug, whole);
+  log.write(LogLevel::Error, std::string(kLongest + 9, '\x80'));
+  Lines lines;
+  std::ifstream written(path);
+  for (std::string line; std::getline(written, line);)
+    lines.push_back(line.substr(line.find(' ') + 1));
+  ASSERT_EQ(lines.size(), 6U);
+  EXPECT_EQ(lines[0], "info " + whole.substr(0, kLongest - 1));
+  EXPECT_EQ(lines[1], "default " + whole.substr(0, kLongest - 1) + "… and 3 bytes more");
+  EXPECT_EQ(lines[2], "debug " + whole);
+  EXPECT_EQ(lines[3], "debug " + whole);
+  EXPECT_TRUE(lines[4].starts_with("error \\x80") && lines[4].ends_with("x80… and 9 bytes more"));
 }
 
 TEST(SmallServices, AnswerWhatTheyAreFor) {

@@ -175,6 +175,24 @@ TEST(DaemonTest, RunsOnceADayAndByForce) {
   EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
 }
 
+TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
+  const TemporaryRoot folder;
+  const std::string none = folder.root.path("/none");
+  const std::string errors = folder.root.path("/errors");
+  const int daemon = forkProcess(
+      [&] {
+        ::setenv("TAVREL_ROOT", none.c_str(), 1);
+        ::execl(TAVREL_BINARY, "tavrel", "-d", nullptr);
+      },
+      errors);
+  EXPECT_EQ(waitFor(daemon), 0);
+  const std::string line = Device::contentOf(errors);
+  EXPECT_EQ(line.substr(line.find(' ')), " error cannot use device root " + none +
+                                             "/: No such file or directory: name the device's "
+                                             "folder with TAVREL_ROOT\n");
+  EXPECT_FALSE(std::filesystem::exists(none));
+}
+
 TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
   for (const bool areClosed : {true, false}) {
     const Device device;

@@ -205,7 +205,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
 
   EXPECT_EQ(device.run({"log", "preview", "--day", "19999"}),
             fails("no log would be submitted for day 19999 (2024-10-03): no "
-                  "whitelisted key has a value on that day"));
+                  "value found for any whitelisted key"));
   const Outcome verbose = device.run({"log", "preview", "--day", "20000", "-v"});
   EXPECT_EQ(verbose.out.size(), xml.out.size());
   EXPECT_NE(verbose.error.find("info: writing tallied log. yesterday=20000\n"), std::string::npos)
@@ -236,7 +236,30 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
 TEST(LogShow, DrawsTheTableOfASubmittedLog) {
   const TemporaryDevice device;
   EXPECT_EQ(device.run({"log", "list"}), prints(""));
-  EXPECT_EQ(device.run({"log", "show"}).status, 1);
+  const auto showFails = [&device](const std::string& why) {
+    EXPECT_EQ(device.run({"log", "show"}),
+              fails("no daily log is here; " + why +
+                    "; 'tavrelctl log preview' shows what a log would hold"));
+  };
+  const std::string own = "com.norvane.tallied.tavrel";
+  const std::string dayKey = "LastCrashLogSerializationDateInDaysSince1970";
+  device.run({"prefs", "set", own, dayKey, "2000000000", "--int"});
+  const auto today = jsonOf(device.run({"status", "--json"}))["today"];
+  const std::string next = "next run: no log for day " + today["day"].dump() + " (" +
+                           today["date"].get<std::string>() + "): ";
+  showFails(next + "diagnostic submission not allowed");
+  device.run(
+      {"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionEnabled", "true", "--bool"});
+  showFails(next + "no usable whitelist");
+  device.write(kWhitelistFile, xmlOf("{}"));
+  device.run({"prefs", "delete", own, dayKey});
+  showFails("last run: none yet");
+  device.run({"prefs", "set", own, dayKey, "20001", "--int"});
+  showFails("last run: day 20001 (2024-10-05), outcome unknown");
+  device.run({"prefs", "set", own, "LastLogOutcome", "nothing-to-report"});
+  showFails("last run: no log for day 20001 (2024-10-05): no value found for any whitelisted key");
+  device.run({"prefs", "set", own, "LastLogOutcome", "filed"});
+  showFails("last run: a log for day 20001 (2024-10-05)");
 
   const std::string log = xmlOf(R"json({
     "BHCrashLogVersion": 1,
@@ -356,6 +379,8 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   EXPECT_EQ(fresh["last_reported_day"], nullptr);
   EXPECT_EQ(fresh["store"]["bytes"], nullptr);
   EXPECT_EQ(fresh["pending_logs"], 0);
+  EXPECT_EQ(fresh["conclusion"]["run"], "next");
+  EXPECT_EQ(fresh["conclusion"]["outcome"], "not-permitted");
 
   fill(device);
   device.run(
@@ -373,7 +398,8 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
         std::string("Last OS version    none yet\n"),
         format("Store              %llu bytes, 1 day held: 20000 (2024-10-04)\n",
                std::uint64_t{bytes}),
-        std::string("Pending logs       1\n")}) {
+        std::string("Pending logs       1\nLast run           day 20001 (2024-10-05), outcome "
+                    "unknown\n")}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
   }
 }

@@ -158,6 +158,7 @@ Roll-over of the support log
 
 In all it would write: 3 preferences, 17 scalars, 4 structured records, 2 logs
 --verbose shows everything, and what logs hold.
+It would file a log for day TODAY (DATE)
 )text";
 
 TEST(Rehearse, TellsEveryStepAndChangesNothing) {
@@ -169,6 +170,7 @@ TEST(Rehearse, TellsEveryStepAndChangesNothing) {
   const Outcome json = device.run({"rehearse", "--forced", "--json"});
   const auto document = nlohmann::json::parse(json.out, nullptr, false);
   EXPECT_EQ(document["run"], "forced");
+  EXPECT_EQ(document["log_outcome"], "nothing-to-report");
   EXPECT_EQ(document["totals"], nlohmann::json::parse(R"({"set_preference": 2, "set_scalar": 17,
                                                          "file_record": 4, "submit_log": 1})"));
   EXPECT_EQ(document["steps"][3]["events"][0], nlohmann::json::parse(R"({
@@ -190,10 +192,12 @@ Roll-over of the support log
 
 End of the gated run
   would checkpoint the statistics store
+  reads preference com.norvane.tallied.tavrel LastLogOutcome: none
+  would set preference com.norvane.tallied.tavrel LastLogOutcome = "nothing-to-report"
   would set preference com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 = YESTERDAY
   would write preferences of com.norvane.tallied.tavrel
 
-In all it would write: 3 preferences,)"),
+In all it would write: 4 preferences,)"),
             std::string::npos);
   device.run({"prefs", "set", "com.norvane.tallied.tavrel",
               "LastCrashLogSerializationDateInDaysSince1970",
@@ -206,6 +210,7 @@ Once-a-day gate
   logs default: Day unchanged since last run
 
 In all it would write: nothing
+It would file no log: the run for day YESTERDAY (DATE) is done
 )");
 }
 

@@ -63,6 +63,18 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
   EXPECT_TRUE(run({"show"}).out.starts_with("Scheduled tasking: none\n"));
 }
 
+TEST_F(TaskingTest, SaysWhatTheDaemonWouldDo) {
+  const auto nextRun = [this](const std::string& tasking) {
+    device.write("/var/mobile/Library/Preferences/com.norvane.Drovelink.plist",
+                 xmlOf(R"({"ScheduledTasking": )" + tasking + "}"));
+    return Json::parse(run({"show", "--json"}).out)["next_run"];
+  };
+  EXPECT_EQ(nextRun(R"({"TaskingID": 4})"), "changes nothing");
+  EXPECT_EQ(nextRun(R"({"TaskingID": "t", "TaskingPayload": [], "TaskingDigest": ")" +
+                    std::string(1U << 20, 'x') + "\"}"),
+            "refuses the scheduled tasking, which preferences cannot hold");
+}
+
 TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
   const std::pair<const char*, std::vector<std::string>> cases[] = {
       {"[1]", {"tasking: must be a dictionary, not an array"}},

@@ -1,16 +1,16 @@
 #include "tools/device/send_commands.h"
 
 #include <algorithm>
-#include <array>
 #include <chrono>
 #include <cstddef>
 #include <memory>
 #include <nlohmann/json.hpp>
-#include <optional>
 #include <ostream>
 #include <string>
 
 #include "base/format.h"
+#include "daemon/app_info.h"
+#include "daemon/app_info_listener.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
@@ -22,45 +22,8 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kServiceName = "com.norvane.tallied.tavrel";
-
-constexpr std::int64_t kAnnounce = 0;
-constexpr std::int64_t kForceDay = 1;
-constexpr std::int64_t kDeliver = 2;
-
-constexpr std::size_t kUuidBytes = 16;
-
-std::optional<unsigned> hexDigit(char c) {
-  if (c >= '0' && c <= '9') return static_cast<unsigned>(c - '0');
-  if (c >= 'a' && c <= 'f') return static_cast<unsigned>(c - 'a') + 10;
-  if (c >= 'A' && c <= 'F') return static_cast<unsigned>(c - 'A') + 10;
-  return std::nullopt;
-}
-
-/// Five groups of 8, 4, 4, 4 and 12 hexadecimal digits, joined by "-".
-plist::Data parseUuid(std::string_view text) {
-  constexpr std::size_t kTextLength = 36;
-  if (text.size() != kTextLength) return {};
-  std::array<std::byte, kUuidBytes> bytes{};
-  std::size_t digits = 0;
-  for (std::size_t i = 0; i < text.size(); ++i) {
-    if (i == 8 || i == 13 || i == 18 || i == 23) {
-      if (text[i] != '-') return {};
-      continue;
-    }
-    const auto digit = hexDigit(text[i]);
-    if (!digit) return {};
-    bytes[digits / 2] = bytes[digits / 2] << 4 | static_cast<std::byte>(*digit);
-    ++digits;
-  }
-  return plist::Data(bytes);
-}
-
-plist::Data uuidOf(const plist::Value& value) {
-  if (const auto text = value.string()) return parseUuid(*text);
-  const plist::Data data = value.data();
-  return data && data.size() == kUuidBytes ? data : plist::Data();
-}
+constexpr std::string_view kFirstRequestWins =
+    "the service acts on one request in its life: it ignores this one if it has had another before";
 
 bool isInteger(const plist::Value& value) {
   const auto number = value.number();
@@ -68,16 +31,17 @@ bool isInteger(const plist::Value& value) {
 }
 
 void send(ToolContext& context, const plist::Dictionary& message, const std::string& done) {
-  auto client = ServiceClient::connect(context.root(), kServiceName);
+  auto client = ServiceClient::connect(context.root(), kAppInfoServiceName);
   if (!client) return context.fail(client.error().message);
   if (const auto sent = client->send(message); !sent) return context.fail(sent.error().message);
   context.out() << done << '\n';
+  if (message.number("operation")->int64() != kDeliverAppInfo) context.note(kFirstRequestWins);
 }
 
 void force(ToolContext& context, const std::string& dayArgument) {
   const auto day = parseDay(dayArgument, context.platform().statistics->BHDaysSince1970());
   if (!day) return context.failUsage(day.error().message);
-  send(context, {{"operation", kForceDay}, {"value", std::int64_t{*day}}},
+  send(context, {{"operation", kForceDay}, {"value", *day}},
        format("Asked for the daily tasks of day %s.", dayText(*day)));
 }
 
@@ -89,7 +53,7 @@ void deliver(ToolContext& context, const std::string& file) {
     const std::string_view name = file == "-" ? "standard input" : std::string_view(file);
     return context.fail(format("%s: %s", name, applications.error().message));
   }
-  send(context, {{"operation", kDeliver}, {"app_data", *applications}},
+  send(context, {{"operation", kDeliverAppInfo}, {"app_data", *applications}},
        format("Delivered %s.", counted(applications->size(), "application")));
 }
 
@@ -165,11 +129,15 @@ Expected<plist::Array> appDataOf(const plist::Value& applications) {
       checked.set(entry, application.get(entry));
     }
     for (const std::string_view entry : {"orbo_id", "arch"}) {
-      if (!isInteger(application.get(entry))) return wrong(entry, "an integer");
-      checked.set(entry, application.get(entry));
+      const plist::Value number = application.get(entry);
+      if (!number) continue;  // the service reads 0
+      if (!isInteger(number)) return wrong(entry, "an integer");
+      checked.set(entry, number);
     }
-    const plist::Data uuid = uuidOf(application.get("uuid"));
-    if (!uuid) return wrong("uuid", "a UUID, as text of 36 characters or 16 bytes of data");
+    const plist::Value uuid = application.get("uuid");
+    if (!appUuidFrom(uuid)) {
+      return wrong("uuid", "a UUID, as text of 36 characters or 16 bytes of data");
+    }
     checked.set("uuid", uuid);
     result.append(checked);
   }
@@ -182,7 +150,7 @@ void addSendCommands(Command app, ToolContext& context) {
   const Command announceCommand =
       group.addCommand("announce", "Announce that app information will be delivered");
   announceCommand.onRun([&context] {
-    send(context, {{"operation", kAnnounce}}, "Announced app information.");
+    send(context, {{"operation", kAnnounceAppInfo}}, "Announced app information.");
   });
 
   const Command forceCommand = group.addCommand("force", "Have the daily tasks of a day run");
@@ -195,7 +163,7 @@ void addSendCommands(Command app, ToolContext& context) {
   deliverCommand
       .addOption("FILE", *file,
                  "Property list or JSON: an array of dictionaries with \"bundle_id\", \"version\", "
-                 "\"orbo_id\", \"arch\" and \"uuid\"; - for standard input")
+                 "\"uuid\", and \"orbo_id\" and \"arch\" unless 0; - for standard input")
       .required();
   deliverCommand.onRun([&context, file] { deliver(context, *file); });
 

@@ -11,8 +11,8 @@ namespace tavrel {
 
 void addSendCommands(Command app, ToolContext& context);
 
-/// The "app_data" of a delivery: `applications` from a file, checked, with each "uuid" as 16 bytes.
-/// The error names the wrong element and entry.
+/// The "app_data" of a delivery: `applications` as they are written in a file, checked. The error
+/// names the element and the entry that is wrong.
 Expected<plist::Array> appDataOf(const plist::Value& applications);
 
 }  // namespace tavrel

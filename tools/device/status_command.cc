@@ -11,6 +11,7 @@
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
 
@@ -27,6 +28,7 @@ struct DeviceStatus {
   std::optional<std::int64_t> storeBytes;  // with its write-ahead log; nothing without a store
   Expected<SqliteHistory::Holdings> holdings = SqliteHistory::Holdings{};
   Expected<std::vector<FileSubmission::FiledLog>> pending = Error{};
+  LogConclusion conclusion;
 };
 
 std::optional<std::int64_t> bytesOfStore(const std::string& path) {
@@ -64,6 +66,7 @@ DeviceStatus takeStatus(ToolContext& context) {
     }
   }
   status.pending = device.submission().logs(FileSubmission::Place::Pending);
+  if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
 }
 
@@ -89,7 +92,8 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
        {"last_reported_day", jsonOfDay(status.lastDay)},
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
        {"store", std::move(store)},
-       {"pending_logs", status.pending ? Json(status.pending->size()) : Json(nullptr)}});
+       {"pending_logs", status.pending ? Json(status.pending->size()) : Json(nullptr)},
+       {"conclusion", status.isStateReadable ? status.conclusion.json() : Json(nullptr)}});
 }
 
 std::string storeText(const DeviceStatus& status) {
@@ -118,6 +122,8 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   table.add({"Store file", status.storePath});
   table.add(
       {"Pending logs", status.pending ? std::to_string(status.pending->size()) : "unreadable"});
+  table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
+             status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
   table.print(context.out(), std::nullopt);
 }
 

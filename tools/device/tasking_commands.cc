@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "config/persisted_state.h"
+#include "daemon/tasking.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/platform.h"
 #include "tools/device/tasking_document.h"
@@ -47,25 +48,29 @@ struct Taskings {
     applied = {get(kTaskingIDKey), get(kTaskingOSKey), get(kTaskingDigestKey),
                get(kTaskingPayloadKey)};
     lastUpdate = get(kLastOSUpdateKey).dictionary();
-    build =
-        context.platform().systemVersion->systemVersionDictionary().get(kProductBuildVersionKey);
+    change = nextTaskingChange(context.platform());
   }
 
-  /// What the next daily run will do.
+  /// What the next daily run does.
   std::string_view nextRun() const {
-    if (!scheduled.identifier) return "changes nothing";
-    if (!applied.identifier) return "applies the scheduled tasking";
-    if (scheduled.identifier == applied.identifier && applied.system == build) {
-      return "changes nothing";
+    switch (change) {
+      case TaskingChange::None:
+        return "changes nothing";
+      case TaskingChange::Apply:
+        return "applies the scheduled tasking";
+      case TaskingChange::Replace:
+        return "takes the applied tasking back and applies the scheduled one";
+      case TaskingChange::Refuse:
+        return "refuses the scheduled tasking, which preferences cannot hold";
     }
-    return "takes the applied tasking back and applies the scheduled one";
+    return "";
   }
 
   plist::Value document;
   Tasking scheduled;
   Tasking applied;
   plist::Dictionary lastUpdate;
-  plist::Value build;
+  TaskingChange change = TaskingChange::None;
 };
 
 std::string text(const plist::Value& value) {

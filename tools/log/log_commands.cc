@@ -15,6 +15,7 @@
 #include "platform/plist/coding.h"
 #include "report/bh_report.h"
 #include "tools/log/filed_logs.h"
+#include "tools/log/log_conclusion.h"
 #include "tools/log/log_document.h"
 #include "tools/log/log_faults.h"
 #include "tools/overlay/overlay_platform.h"
@@ -81,9 +82,10 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
     }
   }
   if (isLatest) {
-    return Error{
-        "no log has been submitted: 'tavrelctl status' says whether submission is allowed, "
-        "'tavrelctl log preview' what a log would hold"};
+    const LogConclusion conclusion = concludeOnLogs(context);
+    return Error{format(
+        "no daily log is here; %s run: %s; 'tavrelctl log preview' shows what a log would hold",
+        conclusion.run(), conclusion.text())};
   }
   return LogEnvelope{"file", name, {}};
 }
@@ -159,15 +161,14 @@ void preview(ToolContext& context, const Arguments& arguments) {
     day = *parsed;
   }
 
-  BHReport(platform).writeLogForYesterday(day, {});
+  const LogOutcome outcome = BHReport(platform).writeLogForYesterday(day, {});
   if (overlay.logs().empty()) {
     const std::string_view reason = overlay.lastError();
     if (!errors.empty()) errors.pop_back();
     for (const std::string& error : errors)
       context.note(error);
-    return context.fail(
-        format("no log would be submitted for day %s: %s", dayText(day),
-               reason.empty() ? "no whitelisted key has a value on that day" : reason));
+    return context.fail(format("no log would be submitted for day %s: %s", dayText(day),
+                               reason.empty() ? whyNoLog(outcome) : reason));
   }
   for (const std::string& error : errors)
     context.note(error);

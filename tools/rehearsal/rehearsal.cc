@@ -34,12 +34,10 @@ Rehearsal rehearse(LinuxPlatform& device, RehearsedRun run) {
   const std::int32_t today = platform.statistics->BHDaysSince1970();
   const std::int32_t day = run == RehearsedRun::Today ? today : previousDay(today);
   const StepObserver onStep = [&recorder](std::string_view step) { recorder.begin(step); };
-  if (run == RehearsedRun::Gated) {
-    runDailyIfNeeded(platform, {}, onStep);
-  } else {
-    dailyTasksForDay(platform, day, {}, onStep);
-  }
-  return {day, std::move(recorder.steps)};
+  const std::optional<LogOutcome> outcome = run == RehearsedRun::Gated
+                                                ? runDailyIfNeeded(platform, {}, onStep)
+                                                : dailyTasksForDay(platform, day, {}, onStep);
+  return {day, std::move(recorder.steps), outcome};
 }
 
 }  // namespace tavrel

@@ -2,9 +2,11 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <vector>
 
+#include "report/log_outcome.h"
 #include "tools/overlay/overlay_events.h"
 
 namespace tavrel {
@@ -25,6 +27,7 @@ struct RehearsedStep {
 struct Rehearsal {
   std::int32_t day;
   std::vector<RehearsedStep> steps;
+  std::optional<LogOutcome> logOutcome;  // nothing when the gate stopped the run
 };
 
 /// Plays the daemon's own run over the device.

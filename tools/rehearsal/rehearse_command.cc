@@ -223,6 +223,10 @@ void print(ToolContext& context, const Rehearsal& rehearsal, RehearsedRun run, b
   const Totals totals = totalsOf(rehearsal);
   out << "\nIn all it would write: " << summaryOf(totals) << '\n';
   if (!verbose && !totals.empty()) out << "--verbose shows everything, and what logs hold.\n";
+  out << format("It would file %s\n",
+                rehearsal.logOutcome
+                    ? logOutcomeText(*rehearsal.logOutcome, dayText(rehearsal.day))
+                    : format("no log: the run for day %s is done", dayText(rehearsal.day)));
 }
 
 Json documentOf(const Rehearsal& rehearsal, RehearsedRun run) {
@@ -239,11 +243,13 @@ Json documentOf(const Rehearsal& rehearsal, RehearsedRun run) {
   Json totals = Json::object();
   for (const auto& [kind, count] : totalsOf(rehearsal))
     totals[phraseOf(kind).name] = count;
-  return {{"run", nameOf(run)},
-          {"day", rehearsal.day},
-          {"date", dayDateText(rehearsal.day)},
-          {"steps", std::move(steps)},
-          {"totals", std::move(totals)}};
+  return {
+      {"run", nameOf(run)},
+      {"day", rehearsal.day},
+      {"date", dayDateText(rehearsal.day)},
+      {"steps", std::move(steps)},
+      {"totals", std::move(totals)},
+      {"log_outcome", rehearsal.logOutcome ? Json(nameOf(*rehearsal.logOutcome)) : Json(nullptr)}};
 }
 
 struct Arguments {

@@ -1,7 +1,5 @@
 #include "tools/shared/tool_context.h"
 
-#include <cerrno>
-#include <cstring>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <stdexcept>
@@ -9,7 +7,6 @@
 
 #include "base/format.h"
 #include "platform/linux/files/device_root.h"
-#include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -62,12 +59,9 @@ const DeviceRoot& ToolContext::root() {
   if (!root_) {
     root_ = std::make_unique<DeviceRoot>(rootFolder_ ? DeviceRoot(*rootFolder_)
                                                      : DeviceRoot::fromEnvironment());
-    const std::string folder = root_->path("/");
-    if (!FileSystem::status(folder)) {
-      const char* const reason = std::strerror(errno);
-      throw std::runtime_error(format(
-          "cannot use device root %s: %s: name the device's folder with --root or TAVREL_ROOT",
-          folder, reason));
+    if (const Status usable = root_->check(); !usable) {
+      throw std::runtime_error(format("%s: name the device's folder with --root or TAVREL_ROOT",
+                                      usable.error().message));
     }
   }
   return *root_;

@@ -4,6 +4,9 @@
 #include <unistd.h>
 #include <utility>
 
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/files/system_error.h"
+
 namespace tavrel {
 
 DeviceRoot::DeviceRoot(std::string root) : root_(std::move(root)) {
@@ -14,6 +17,12 @@ DeviceRoot::DeviceRoot(std::string root) : root_(std::move(root)) {
 DeviceRoot DeviceRoot::fromEnvironment() {
   const char* root = std::getenv("TAVREL_ROOT");
   return DeviceRoot(root ? root : "/");
+}
+
+Status DeviceRoot::check() const {
+  const std::string folder = path("/");
+  if (!FileSystem::status(folder)) return systemError("use device root", folder);
+  return Done{};
 }
 
 std::string DeviceRoot::path(std::string_view devicePath) const {

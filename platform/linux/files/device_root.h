@@ -10,6 +10,8 @@
 #include <string>
 #include <string_view>
 
+#include "base/expected.h"
+
 namespace tavrel {
 
 class DeviceRoot {
@@ -18,6 +20,9 @@ class DeviceRoot {
 
   /// The folder that TAVREL_ROOT names, otherwise "/".
   static DeviceRoot fromEnvironment();
+
+  /// An error when the folder is not there or may not be entered. Services would make it.
+  Status check() const;
 
   /// The path on this machine of a path on the device.
   std::string path(std::string_view devicePath) const;

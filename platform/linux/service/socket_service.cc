@@ -37,7 +37,7 @@ std::unique_ptr<ServiceListener> SocketServices::createListener(std::string_view
   }
   auto socket = ServiceSocket::open(root_, name);
   if (!socket) {
-    log_.log(LogLevel::Debug, "%s: %s", name, socket.error().message);
+    log_.log(LogLevel::Default, "%s: %s", name, socket.error().message);
     return nullptr;
   }
   return std::make_unique<SocketListener>(std::string(name), *std::move(socket), loop_, log_);

@@ -77,7 +77,16 @@ void appendPrintable(std::string& out, std::string_view text) {
   }
 }
 
-bool writeWhole(int descriptor, std::string_view bytes) {
+/// The last place up to `at` where no character is cut apart; `at` where the text is no UTF-8.
+std::size_t characterBoundary(std::string_view text, std::size_t at) {
+  constexpr std::size_t kContinuationBytes = 3;
+  for (std::size_t back = 0; back <= kContinuationBytes && back <= at; ++back) {
+    if ((static_cast<unsigned char>(text[at - back]) & 0xC0U) != 0x80U) return at - back;
+  }
+  return at;
+}
+
+bool writeBytes(int descriptor, std::string_view bytes) {
   while (!bytes.empty()) {
     const ssize_t written = ::write(descriptor, bytes.data(), bytes.size());
     if (written < 0) {
@@ -92,7 +101,7 @@ bool writeWhole(int descriptor, std::string_view bytes) {
 /// An entry too large for a datagram travels in a sealed memory file.
 bool sendInMemoryFile(int socket, std::string_view entry) {
   const Descriptor file(memfd_create("tavrel-log", MFD_CLOEXEC | MFD_ALLOW_SEALING));
-  if (!file || !writeWhole(file.get(), entry)) return false;
+  if (!file || !writeBytes(file.get(), entry)) return false;
   constexpr int kSeals = F_SEAL_SEAL | F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
   if (fcntl(file.get(), F_ADD_SEALS, kSeals) != 0) return false;
 
@@ -115,10 +124,29 @@ LinuxSystemLog::LinuxSystemLog(int errorStream, std::string journalSocket)
     : errorStream_(errorStream), journalPath_(std::move(journalSocket)) {}
 
 void LinuxSystemLog::write(LogLevel level, std::string_view message) {
-  if (way_ == Way::Undecided) {
-    streamIsJournal_ = isStreamTheJournal();
-    way_ = streamIsJournal_ && connectToJournal() ? Way::Journal : Way::Stream;
+  if (level == LogLevel::Debug || message.size() <= kLongestMessage) {
+    return writeWhole(level, message);
   }
+  const std::size_t shown = characterBoundary(message, kLongestMessage);
+  std::string cut(message.substr(0, shown));
+  cut += "… and " + std::to_string(message.size() - shown) + " bytes more";
+  writeWhole(level, cut);
+  writeWhole(LogLevel::Debug, message);
+}
+
+bool LinuxSystemLog::isJournal() {
+  decideWay();
+  return streamIsJournal_;
+}
+
+void LinuxSystemLog::decideWay() {
+  if (way_ != Way::Undecided) return;
+  streamIsJournal_ = isStreamTheJournal();
+  way_ = streamIsJournal_ && connectToJournal() ? Way::Journal : Way::Stream;
+}
+
+void LinuxSystemLog::writeWhole(LogLevel level, std::string_view message) {
+  decideWay();
   if (way_ == Way::Journal && sendToJournal(level, message)) return;
   writeToStream(level, message);
 }
@@ -182,7 +210,7 @@ void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) con
     message.remove_prefix(end + 1);
   }
   line += '\n';
-  writeWhole(errorStream_, line);
+  writeBytes(errorStream_, line);
 }
 
 }  // namespace tavrel

@@ -6,10 +6,15 @@
 // written on standard error at once, as "TIME LEVEL message", further lines indented and control
 // characters escaped.
 //
-// All levels are written; the journal decides what to keep and what to show.
+// A message above debug level that is longer than `kLongestMessage` is cut there, its end saying
+// how much is missing, and follows whole at debug level.
+//
+// Every level is written; what to keep and what to show is the journal's business.
 #pragma once
 
+#include <cstddef>
 #include <string>
+#include <string_view>
 
 #include "platform/linux/files/descriptor.h"
 #include "platform/system_log.h"
@@ -25,9 +30,17 @@ class LinuxSystemLog final : public SystemLog {
 
   void write(LogLevel level, std::string_view message) override;
 
+  /// Whether standard error is the journal's.
+  bool isJournal();
+
+  /// Bytes of a message, without the words about what was cut.
+  static constexpr std::size_t kLongestMessage = 8192;
+
  private:
   enum class Way { Undecided, Journal, Stream };
 
+  void decideWay();
+  void writeWhole(LogLevel level, std::string_view message);
   bool isStreamTheJournal() const;
   bool connectToJournal();
   bool sendToJournal(LogLevel level, std::string_view message);

@@ -1,4 +1,4 @@
-#include "platform/linux/process/linux_standard_streams.h"
+#include "platform/linux/system_log/linux_standard_streams.h"
 
 #include <cerrno>
 #include <unistd.h>
@@ -23,7 +23,9 @@ void LinuxStandardStreams::writeOutput(std::string_view text) {
 }
 
 void LinuxStandardStreams::writeError(std::string_view text) {
-  writeAll(STDERR_FILENO, text);
+  if (!log_.isJournal()) return writeAll(STDERR_FILENO, text);
+  if (text.ends_with('\n')) text.remove_suffix(1);  // each text is a message
+  log_.write(LogLevel::Debug, text);
 }
 
 }  // namespace tavrel

@@ -1,0 +1,23 @@
+// The standard streams of the process. Under the journal a text on standard error becomes an entry
+// at debug level: it tells who works on tavrel how a run went, and would be taken for trouble
+// otherwise.
+#pragma once
+
+#include "platform/linux/system_log/linux_system_log.h"
+#include "platform/standard_streams.h"
+
+namespace tavrel {
+
+class LinuxStandardStreams final : public StandardStreams {
+ public:
+  /// The log must outlive it.
+  explicit LinuxStandardStreams(LinuxSystemLog& log) : log_(log) {}
+
+  void writeOutput(std::string_view text) override;
+  void writeError(std::string_view text) override;
+
+ private:
+  LinuxSystemLog& log_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,65 @@
+#include "report/log_outcome.h"
+
+#include <cstddef>
+#include <iterator>
+
+#include "config/bh_config.h"
+#include "config/persisted_state.h"
+
+namespace tavrel {
+namespace {
+
+struct OutcomeTexts {
+  std::string_view name;
+  std::string_view reason;
+};
+
+// One row per outcome, in their order. The reasons hold for past and future runs.
+constexpr OutcomeTexts kTexts[] = {
+    {"filed", ""},
+    {"not-permitted", "diagnostic submission not allowed"},
+    {"no-whitelist", "no usable whitelist"},
+    {"nothing-to-report", "no value found for any whitelisted key"},
+    {"not-filed", "filing failed, the system log says why"},
+};
+static_assert(std::size(kTexts) == static_cast<std::size_t>(LogOutcome::NotFiled) + 1);
+
+const OutcomeTexts& textsOf(LogOutcome outcome) {
+  return kTexts[static_cast<std::size_t>(outcome)];
+}
+
+}  // namespace
+
+std::string_view whyNoLog(LogOutcome outcome) {
+  return textsOf(outcome).reason;
+}
+
+std::string logOutcomeText(LogOutcome outcome, std::string_view day) {
+  if (outcome == LogOutcome::Filed) return format("a log for day %s", day);
+  return format("no log for day %s: %s", day, whyNoLog(outcome));
+}
+
+std::string_view nameOf(LogOutcome outcome) {
+  return textsOf(outcome).name;
+}
+
+std::optional<LogOutcome> obstacleToLog(Platform& platform) {
+  if (!platform.submission->isDiagnosticSubmissionEnabled()) return LogOutcome::NotPermitted;
+  if (!platform.files->size(kWhitelistPath)) return LogOutcome::NoWhitelist;
+  return std::nullopt;
+}
+
+std::optional<LogOutcome> lastLogOutcome(Preferences& preferences) {
+  const plist::Value stored = preferences.ZTXPreferencesGetValue(kLastLogOutcomeKey, kTavrelDomain);
+  for (std::size_t i = 0; i < std::size(kTexts); ++i) {
+    if (stored.string() == kTexts[i].name) return static_cast<LogOutcome>(i);
+  }
+  return std::nullopt;
+}
+
+void rememberLogOutcome(Preferences& preferences, LogOutcome outcome) {
+  if (lastLogOutcome(preferences) == outcome) return;
+  preferences.ZTXPreferencesSetValue(kLastLogOutcomeKey, nameOf(outcome), kTavrelDomain);
+}
+
+}  // namespace tavrel

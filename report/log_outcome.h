@@ -1,0 +1,36 @@
+// How the log of a day came out, in the words that daemon and tool share.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "platform/platform.h"
+
+namespace tavrel {
+
+enum class LogOutcome : std::uint8_t {
+  Filed,
+  NotPermitted,
+  NoWhitelist,
+  NothingToReport,
+  NotFiled,  // the system log has the error
+};
+
+/// Why there is no log, such as "diagnostic submission not allowed"; empty for a filed one.
+std::string_view whyNoLog(LogOutcome outcome);
+/// "a log for day DAY", or "no log for day DAY: " and the reason.
+std::string logOutcomeText(LogOutcome outcome, std::string_view day);
+/// Its name in preferences and JSON, such as "not-permitted".
+std::string_view nameOf(LogOutcome outcome);
+
+/// What would keep a run from filing a log, as far as can be told without making one.
+std::optional<LogOutcome> obstacleToLog(Platform& platform);
+
+/// The outcome of the last gated run, kept in the daemon's own domain. Nothing when none is known.
+std::optional<LogOutcome> lastLogOutcome(Preferences& preferences);
+/// Sets the preference where it changes; synchronising the domain is the caller's business.
+void rememberLogOutcome(Preferences& preferences, LogOutcome outcome);
+
+}  // namespace tavrel

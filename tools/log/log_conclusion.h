@@ -1,0 +1,29 @@
+// What is known of the daily log without making one: what stands in the way of the next, or how the
+// last one came out.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "report/log_outcome.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+struct LogConclusion {
+  bool isOfNextRun = false;           // else of the last gated one
+  std::optional<std::int32_t> day;    // nothing before the first run
+  std::optional<LogOutcome> outcome;  // nothing when it is not known
+
+  /// "next" or "last".
+  const char* run() const { return isOfNextRun ? "next" : "last"; }
+  /// Such as "no log for day 20781 (2026-11-24): no usable whitelist".
+  std::string text() const;
+  /// {"run": "next", "day": 20781, "outcome": "no-whitelist"}, null for what is not known.
+  Json json() const;
+};
+
+LogConclusion concludeOnLogs(ToolContext& context);
+
+}  // namespace tavrel
