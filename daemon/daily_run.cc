@@ -56,9 +56,15 @@ void runDailyIfNeeded(Platform& platform, const plist::Array& appInfo, const Ste
   }
   dailyTasksForDay(platform, yesterday, appInfo, onStep);
   beginStep(onStep, "End of the gated run");
-  // What the tasks have set must not be lost to a kill once the day counts as done.
+  // What the tasks have set must not be lost once the day counts as done.
+  bool isKept = true;
   runGuarded(platform.log, "checkpoint the store after the tasks",
-             [&] { platform.statistics->BHClientCheckpoint(); });
+             [&] { isKept = platform.statistics->BHClientCheckpoint(); });
+  if (!isKept) {
+    platform.log->log(LogLevel::Error,
+                      "the statistics of the run are not kept: day %d stays undone", yesterday);
+    return;
+  }
   platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);
 }
