@@ -163,6 +163,7 @@ TEST(EccEvents, AreKeptApartByBoots) {
     std::array<std::byte, kEccEventBytes> first{};
     EXPECT_EQ(events.next(first).errorNumber, 0);
     EXPECT_EQ(first[0], std::byte{8});
+    events.filed();
   };
   // What was remembered before boots were is of this one.
   device.write("/var/lib/tavrel/edac-counters.plist",

@@ -9,6 +9,7 @@
 #include "base/format.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
 #include "tests/platform/temporary_root.h"
 #include "tests/system/child_process.h"
 
