@@ -44,6 +44,10 @@ inline constexpr std::size_t kStatisticsEntries = 1'000'000;
 /// How long to wait for a locked statistics store, in milliseconds.
 inline constexpr int kStoreBusyMilliseconds = 10'000;
 
+/// Bytes of the statistics that wait in a file beside a store that cannot be written: some sixty
+/// days of a run's scalars.
+inline constexpr std::size_t kKeptValueBytes = 1U << 20;
+
 /// Bytes of the name of a preference domain. Tasking supplies domains; with its endings the name
 /// must fit the 255 bytes of a file name.
 inline constexpr std::size_t kPreferenceDomainBytes = 200;

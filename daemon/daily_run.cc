@@ -77,9 +77,15 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
   if (hasRun) noteDaysPassedOver(platform.log, lastRunDay, yesterday);
   const LogOutcome outcome = dailyTasksForDay(platform, yesterday, appInfo, onStep);
   beginStep(onStep, "End of the gated run");
-  // A kill must not lose what the tasks have set once the day counts as done.
+  // What the tasks have set must not be lost once the day counts as done.
+  bool isKept = false;
   runGuarded(platform.log, "checkpoint the store after the tasks",
-             [&] { platform.statistics->BHClientCheckpoint(); });
+             [&] { isKept = platform.statistics->BHClientCheckpoint(); });
+  if (!isKept) {
+    platform.log->log(LogLevel::Error,
+                      "the statistics of the run are not kept: day %d stays undone", yesterday);
+    return outcome;
+  }
   rememberLogOutcome(platform.preferences, outcome);
   platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);

@@ -102,8 +102,9 @@ class StatisticsStore {
   /// The instant at which a day begins.
   virtual plist::Date dateForDaysSince1970(std::int32_t day) = 0;
 
-  /// Commits the values set so far and moves the write-ahead log into the database.
-  virtual void BHClientCheckpoint() = 0;
+  /// Commits the values set so far and moves the write-ahead log into the database. False when
+  /// the values would be lost at the end of the process.
+  virtual bool BHClientCheckpoint() = 0;
 
   /// Sets today's value of a scalar. Values are committed together, at the next checkpoint and at
   /// the end of the run.

@@ -55,12 +55,12 @@ struct LinuxPlatform::Services {
       root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
   FileSubmission submission{root,  fileSystem, propertyLists, preferences, systemVersion,
                             clock, log};
-  FileCrashReporting crashReporting{root, fileSystem, systemVersion, clock, log};
+  EccEvents eccEvents{root, fileSystem, propertyLists, log,
+                      options.readOnly ? EccEvents::Mode::Peek : EccEvents::Mode::Consume};
+  FileCrashReporting crashReporting{root, fileSystem, systemVersion, eccEvents, clock, log};
   LinuxApplications applications{root, log};
   LinuxLocale locale{root, log};
-  LinuxSystemControls systemControls{
-      root, fileSystem, propertyLists, log,
-      options.readOnly ? EccEvents::Mode::Peek : EccEvents::Mode::Consume};
+  LinuxSystemControls systemControls{root, fileSystem, propertyLists, log, eccEvents};
   LinuxDynamicLoader dynamicLoader{root, fileSystem, propertyLists, log, preferences};
   FileNotifications notifications{root, log};
   LinuxEventLoop eventLoop;

@@ -68,6 +68,14 @@ TEST_F(DailyRunTest, RunsOncePerDay) {
   EXPECT_EQ(fake.log.messages().back(), "Day unchanged since last run");
 }
 
+TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
+  fake.store.keepsValues = false;
+  runDailyIfNeeded(fake.platform, {});
+  EXPECT_FALSE(storedDay());
+  EXPECT_EQ(fake.log.messages().back(),
+            "the statistics of the run are not kept: day 19999 stays undone");
+}
+
 TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
   fake.systemVersion.version = {{kProductBuildVersionKey, "21A5"}};
   dailyTasksForDay(fake.platform, 19999, {});

@@ -93,10 +93,14 @@ struct FakeStore : StatisticsStore {
   std::vector<std::tuple<std::string, std::int32_t, std::int64_t>> scalars;
   std::vector<std::tuple<std::string, std::int32_t, std::vector<double>>> distributions;
   std::set<std::string> keysRead;  // distributions whose values were asked for
+  bool keepsValues = true;
 
   std::int32_t BHDaysSince1970() override { return today; }
   plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
-  void BHClientCheckpoint() override { journal.push_back("checkpoint"); }
+  bool BHClientCheckpoint() override {
+    journal.push_back("checkpoint");
+    return keepsValues;
+  }
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     journal.push_back(format("scalar %s", key));
     scalars.emplace_back(key, today, value);

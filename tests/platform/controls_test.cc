@@ -42,7 +42,8 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
                                          {"vm.swapusage", 7}});
   // The whole buffer is shown, in hexadecimal.
   using Case = std::tuple<const char*, std::size_t, int, const char*>;
-  LinuxSystemControls controls(device.root, files, coding, log);
+  EccEvents eccEvents(device.root, files, coding, log, EccEvents::Mode::Consume);
+  LinuxSystemControls controls(device.root, files, coding, log, eccEvents);
   for (const auto& [name, size, errorNumber, shown] :
        {Case("bytes", 4, 0, "010203ee"), Case("bytes", 2, ENOMEM, "eeee"),
         Case("twelve", 8, 0, "0c00000000000000"), Case("twelve", 0, ENOMEM, ""),
@@ -73,7 +74,8 @@ TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
   for (std::string word; meminfo >> word;) {
     if (word == "SwapTotal:") meminfo >> kibibytes;
   }
-  LinuxSystemControls controls(device.root, files, coding, log);
+  EccEvents eccEvents(device.root, files, coding, log, EccEvents::Mode::Consume);
+  LinuxSystemControls controls(device.root, files, coding, log, eccEvents);
   std::array<std::byte, kSwapUsageBytes> record{};
   const auto result = controls.read("vm.swapusage", record);
   EXPECT_EQ(result.errorNumber, 0);

@@ -48,6 +48,7 @@ std::string all(EccEvents& events) {
       continue;
     }
     EXPECT_EQ(result.length, kEccEventBytes);
+    events.filed();
     text += std::to_string(std::to_integer<int>(buffer[0])) + ":";
     for (std::size_t i = 0; i < std::to_integer<std::size_t>(buffer[1]); ++i)
       text += " " + std::to_string(loadLittle64(buffer, 8 + 8 * i).value());
@@ -81,12 +82,15 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
 
   device.log.lines.clear();
   {
-    LinuxSystemControls controls(device.root, device.files, device.coding, device.log);
+    auto queue = device.events();
+    LinuxSystemControls controls(device.root, device.files, device.coding, device.log, queue);
     std::array<std::byte, kEccEventBytes + 8> buffer{};
     EXPECT_EQ(controls.read("kern.next_ecc_event", MutableByteSpan(buffer).first(71)).errorNumber,
               ENOMEM);
     EXPECT_EQ(controls.read("kern.next_ecc_event", buffer).errorNumber, 0);
     EXPECT_EQ(buffer[0], std::byte{1});
+    EXPECT_EQ(device.queue().front(), "01.event");
+    queue.filed();
     EXPECT_EQ(device.queue().front(), "015.errno");
   }
   auto events = device.events();
@@ -100,6 +104,26 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   device.write(std::string(kQueue) + "05.event.unusable/in", "the way");
   EXPECT_EQ(all(events), "");
   EXPECT_TRUE(device.log.lines.back().ends_with("05.event.unusable: Is a directory"));
+}
+
+// Ten events a run, and none behind one that was not filed; what is left waits for the next run.
+TEST(EccEvents, LeaveTheQueueWhenTheyAreFiled) {
+  EccDevice device;
+  for (char i = 0; i < 12; ++i)
+    device.event((std::string(1, static_cast<char>('a' + i)) + ".event").c_str(), i);
+  auto peek = device.events(EccEvents::Mode::Peek);
+  EXPECT_EQ(all(peek), "0:; 1:; 2:; 3:; 4:; 5:; 6:; 7:; 8:; 9:; errno 16; 10:; 11:; ");
+  auto events = device.events();
+  auto others = device.events();
+  std::array<std::byte, kEccEventBytes> event{};
+  for (int run = 0; run < 2; ++run) {
+    EXPECT_EQ(events.next(event).errorNumber, 0);
+    EXPECT_EQ(events.next(event).errorNumber, EBUSY);
+  }
+  EXPECT_EQ(device.queue().size(), 12U);
+  EXPECT_EQ(all(events), "0:; 1:; 2:; 3:; 4:; 5:; 6:; 7:; 8:; 9:; errno 16; 10:; 11:; ");
+  EXPECT_EQ(all(others), "") << "the folder is free again";
+  EXPECT_TRUE(device.log.lines.empty());
 }
 
 TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
@@ -139,6 +163,7 @@ TEST(EccEvents, AreKeptApartByBoots) {
     std::array<std::byte, kEccEventBytes> first{};
     EXPECT_EQ(events.next(first).errorNumber, 0);
     EXPECT_EQ(first[0], std::byte{8});
+    events.filed();
   };
   // What was remembered before boots were is of this one.
   device.write("/var/lib/tavrel/edac-counters.plist",

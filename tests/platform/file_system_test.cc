@@ -46,7 +46,7 @@ TEST(FileSystem, ReplacesWholeFilesAndKeepsTheirMode) {
   EXPECT_EQ(FileSystem::status(path)->st_mode & 0777U, 0640U);
   ASSERT_EQ(chmod(path.c_str(), 0604), 0);
   ASSERT_TRUE(files.replace(path, asBytes("two"), 0640));
-  EXPECT_EQ(FileSystem::status(path)->st_mode & 0777U, 0604U);
+  EXPECT_EQ(FileSystem::status(path)->st_mode & 0777U, 0600U) << "0640 gives others nothing";
   {
     auto abandoned = files.create(path, 0640);
     ASSERT_TRUE(abandoned);
@@ -82,17 +82,22 @@ TEST(FileSystem, AppendsWholeLines) {
   const TemporaryRoot device;
   FileSystem files;
   const std::string path = device.root.path("/logs/lines");
-  {
-    auto file = files.openToAppend(path, 0640);
-    ASSERT_TRUE(file && file->append(asBytes("one\n"), 100));
-    ASSERT_TRUE(file->append(asBytes("tw"), 100));  // as a cut leaves it
+  const std::string zeros(5000, '\0');  // more than a block
+  for (const std::string& torn : {std::string(), std::string("tw"), zeros, zeros + '\n',
+                                  '\n' + zeros + "\n\n" + zeros, zeros + "\ntw" + zeros}) {
+    for (const std::string whole : {"", "one\n", "\1\n"}) {
+      device.write("/logs/lines", whole + torn);
+      auto file = files.openToAppend(path, 0640);
+      ASSERT_TRUE(file && file->append(asBytes("2\n"), 100));
+      EXPECT_EQ(*files.read(path, 20'000), whole + "2\n");
+    }
   }
+  device.write("/logs/lines", "one\n");
   auto file = files.openToAppend(path, 0640);
   ASSERT_TRUE(file && file->append(asBytes("three\n"), 100) && file->append(asBytes("4\n"), 100));
-  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n");
-  EXPECT_EQ(messageOf(file->append(asBytes("five\n"), 19)),
-            "cannot append to " + path + ": it may have 19 bytes");
-  ASSERT_TRUE(file->append(asBytes("5\n"), 19));
+  EXPECT_EQ(messageOf(file->append(asBytes("five\n"), 16)),
+            "cannot append to " + path + ": it may have 16 bytes");
+  ASSERT_TRUE(file->append(asBytes("5\n"), 16));
   file = Error{"released"};
 
   FaultyFileSystem faulty(device.root.path("/"), FaultyFileSystem::Fault::Failure, 2);
@@ -100,7 +105,7 @@ TEST(FileSystem, AppendsWholeLines) {
   EXPECT_EQ(messageOf(full->append(asBytes("six\n"), 100)),
             "cannot write " + path + ": No space left on device; free some space");
   EXPECT_TRUE(full->append(asBytes("seven\n"), 100));
-  EXPECT_EQ(*files.read(path, 100), "one\ntw\nthree\n4\n5\nseven\n");
+  EXPECT_EQ(*files.read(path, 100), "one\nthree\n4\n5\nseven\n");
 }
 
 TEST(FileSystem, AReplacedFileIsOldOrNewAfterEveryFault) {

@@ -33,6 +33,7 @@ struct Services : TemporaryRoot {
   plist::PlistCoding propertyLists;
   LinuxSystemVersion version{root, files, propertyLists, log};
   FileDeviceAnswers answers{root, files, propertyLists, log};
+  EccEvents eccEvents{root, files, propertyLists, log, EccEvents::Mode::Consume};
 
   std::string read(std::string_view path) const {
     return *FileSystem().read(root.path(path), 1U << 20);
@@ -87,7 +88,8 @@ TEST(SystemVersion, IsReadOrMadeFromOsRelease) {
 
 TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {
   Services device;
-  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  FileCrashReporting reporting(device.root, device.files, device.version, device.eccEvents,
+                               device.clock, device.log);
   const std::string folder = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
   const std::byte bytes[] = {std::byte{0xAB}, std::byte{0x01}};
   reporting.FLLogStructuredData(
@@ -115,7 +117,8 @@ TEST(CrashReporting, KeepsRecordsPerTypeAndDayForThirtyDays) {
 
 TEST(CrashReporting, RollsTheSupportLog) {
   Services device;
-  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  FileCrashReporting reporting(device.root, device.files, device.version, device.eccEvents,
+                               device.clock, device.log);
   const std::string log = "/var/mobile/Library/Logs/NorvaneCare/support.log";
   const auto held = [&] {
     std::string all;
@@ -140,7 +143,8 @@ TEST(CrashReporting, RollsTheSupportLog) {
 
 TEST(CrashReporting, NamesTheDevice) {
   Services device;
-  FileCrashReporting reporting(device.root, device.files, device.version, device.clock, device.log);
+  FileCrashReporting reporting(device.root, device.files, device.version, device.eccEvents,
+                               device.clock, device.log);
   device.write("/etc/machine-id", "0123456789abcdef0123456789abcdef\n");
   device.write("/sys/firmware/devicetree/base/model", std::string("Pellio \tBoard 2\0", 16));
   const std::regex uuid("[0-9A-F]{8}-[0-9A-F]{4}-4[0-9A-F]{3}-[89AB][0-9A-F]{3}-[0-9A-F]{12}");

@@ -29,7 +29,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
             "{\n  \"format_version\": 1,\n  \"records\": []\n}\n");
 
   const std::string hostile[] = {"{\"time\":1}", "\xff", std::string(5000, '['),
-                                 R"({"time":"x","type":172,"record":{"a":)"};
+                                 std::string(3, '\0'), R"({"time":"x","type":172,"record":{"a":)"};
   std::string ecc = kEccLine;
   for (const std::string& line : hostile)
     ecc += line + (line.ends_with(':') ? "" : "\n");
@@ -40,21 +40,26 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
   device.write(kRecords + "notes.txt", kEccLine);
   device.write(kRecords + "4294967296-2026-11-27.jsonl", kEccLine);
 
+  const std::string torn = "tavrelctl: 2 lines of " + device.path(kRecords) +
+                           "172-2026-11-27.jsonl left out, torn by a kill or a power cut; the "
+                           "first is line 5\n";
   EXPECT_EQ(device.run({"records", "list"}),
-            prints(format("TYPE  DAY                 RECORDS  BYTES\n"
-                          " 176  20759 (2026-11-02)        1     %zu\n"
-                          " 172  20784 (2026-11-27)        5   %zu\n"
-                          " 176  20784 (2026-11-27)        1    %zu\n",
-                          recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}").size(),
-                          ecc.size(), kTelemetryLine.size() + 1)));
+            (Outcome{1,
+                     format("TYPE  DAY                 RECORDS  BYTES\n"
+                            " 176  20759 (2026-11-02)        1     %zu\n"
+                            " 172  20784 (2026-11-27)        4   %zu\n"
+                            " 176  20784 (2026-11-27)        1    %zu\n",
+                            recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}").size(),
+                            ecc.size(), kTelemetryLine.size() + 1),
+                     torn}));
   const Outcome all = device.run({"records", "show"});
-  EXPECT_EQ(all.status, 0);
+  EXPECT_EQ(all.status, 1);
   EXPECT_EQ(all.out,
             "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
             "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
             "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n");
   EXPECT_EQ(all.error,
-            "tavrelctl: 4 lines passed over, no record; the first is line 2 of " +
+            torn + "tavrelctl: 3 lines passed over, no record; the first is line 2 of " +
                 device.path(kRecords) +
                 "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n");
   EXPECT_EQ(device.run({"records", "show", "--day", "2026-11-02"}).out,
@@ -89,7 +94,9 @@ TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
   };
   EXPECT_EQ(read("a\n" + large, false), (std::vector<std::string>{"1a"}));
   EXPECT_EQ(read("a\n" + large + "b\nc", false), (std::vector<std::string>{"2" + large + "b"}));
-  EXPECT_EQ(read("a\n" + large + "b\nc", true), (std::vector<std::string>{"3c"}));
+  EXPECT_TRUE(reader.wholeness());
+  EXPECT_EQ(read("a\n" + large + "b\nc", true), std::vector<std::string>());
+  EXPECT_FALSE(reader.wholeness());
   EXPECT_EQ(read("new\n", false), (std::vector<std::string>{"1new"}));
 }
 

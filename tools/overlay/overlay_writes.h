@@ -187,8 +187,9 @@ class OverlayStore final : public StatisticsStore {
   plist::Date dateForDaysSince1970(std::int32_t day) override {
     return below_.dateForDaysSince1970(day);
   }
-  void BHClientCheckpoint() override {
+  bool BHClientCheckpoint() override {
     events_.tell(OverlayEvent::Kind::Checkpoint, "the statistics store");
+    return true;
   }
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     events_.tell(OverlayEvent::Kind::SetScalar, std::string(key), value);

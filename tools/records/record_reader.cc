@@ -11,6 +11,7 @@
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/system_error.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
 namespace tavrel {
@@ -20,14 +21,14 @@ constexpr std::size_t kBlockBytes = 64U << 10;
 
 }  // namespace
 
-Status RecordReader::read(bool takesRest, const LineHandler& handler) {
+Status RecordReader::read(bool isComplete, const LineHandler& handler) {
   const Descriptor file(open(path_.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
   struct stat status {};
   if (!file || fstat(file.get(), &status) != 0) return systemError("read", path_);
   if (!S_ISREG(status.st_mode)) return Error{"cannot read " + path_ + ": it is no regular file"};
   if (status.st_size < offset_) {
     offset_ = 0;
-    lines_ = 0;
+    lines_ = tornLines_ = 0;
     rest_.clear();
   }
   for (;;) {
@@ -47,13 +48,29 @@ Status RecordReader::read(bool takesRest, const LineHandler& handler) {
     std::size_t begin = 0;
     std::size_t searched = kept;  // the kept text has no line end
     for (std::size_t end; (end = rest_.find('\n', searched)) != std::string::npos;) {
-      handler(std::string_view(rest_).substr(begin, end - begin), ++lines_);
+      const std::string_view line = std::string_view(rest_).substr(begin, end - begin);
+      if (!line.empty() && line.find_first_not_of('\0') == std::string_view::npos) {
+        leaveOutTornLine();
+      } else {
+        handler(line, ++lines_);
+      }
       begin = searched = end + 1;
     }
     rest_.erase(0, begin);
   }
-  if (takesRest && !rest_.empty()) handler(std::exchange(rest_, {}), ++lines_);
+  if (isComplete && !std::exchange(rest_, {}).empty()) leaveOutTornLine();
   return Done{};
+}
+
+void RecordReader::leaveOutTornLine() {
+  ++lines_;
+  if (tornLines_++ == 0) firstTornLine_ = lines_;
+}
+
+Status RecordReader::wholeness() const {
+  if (tornLines_ == 0) return Done{};
+  return Error{format("%s of %s left out, torn by a kill or a power cut; the first is line %llu",
+                      counted(tornLines_, "line"), path_, firstTornLine_)};
 }
 
 Expected<StructuredRecord> parseRecord(std::string_view line) {

@@ -18,16 +18,23 @@ class RecordReader {
 
   explicit RecordReader(std::string path) : path_(std::move(path)) {}
 
-  /// The lines since the last call. With `takesRest` also the text after the last line end. A line
-  /// of more than `limits::kStructuredRecordFileBytes` is an error.
-  Status read(bool takesRest, const LineHandler& handler);
+  /// The lines that came since the last call. A line of more than
+  /// `limits::kStructuredRecordFileBytes` is an error. Lines that a kill or a power cut tore are
+  /// left out: those of zero bytes, and, when the file `isComplete`, a last one without its end.
+  Status read(bool isComplete, const LineHandler& handler);
+  /// An error when lines were left out as torn.
+  Status wholeness() const;
 
   const std::string& path() const { return path_; }
 
  private:
+  void leaveOutTornLine();
+
   std::string path_;
   std::int64_t offset_ = 0;  // of what comes after `rest_`
   std::uint64_t lines_ = 0;
+  std::uint64_t tornLines_ = 0;
+  std::uint64_t firstTornLine_ = 0;
   std::string rest_;  // the beginning of a line
 };
 

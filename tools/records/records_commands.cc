@@ -70,9 +70,11 @@ void list(ToolContext& context, const Selection& selection) {
   Json entries = Json::array();
   for (const RecordFile& file : *files) {
     std::uint64_t records = 0;
-    const Status read = RecordReader(file.path).read(
+    RecordReader reader(file.path);
+    const Status read = reader.read(
         true, [&](std::string_view line, std::uint64_t) { records += line.empty() ? 0U : 1U; });
     if (!read) context.fail(read.error().message);
+    if (const Status whole = reader.wholeness(); !whole) context.fail(whole.error().message);
     const auto status = FileSystem::status(file.path);
     const std::string date = dateText(civilFromDays(file.is.day));
     if (context.json()) {
@@ -145,6 +147,7 @@ class RecordsView {
                           context_.json() ? std::string(line) : recordText(record->content)});
         });
     if (!read) tellOnce(read.error().message);
+    if (const Status whole = reader->second.wholeness(); !whole) tellOnce(whole.error().message);
   }
 
   // JSON exactly as it was filed, so that no digit of a number is lost.

@@ -79,12 +79,23 @@ SystemControls::Result give(std::string_view event, MutableByteSpan buffer) {
 
 SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
   if (buffer.size() < kEccEventBytes) return {ENOMEM, 0};
+  if (!unfiled_.empty() || handedOut_ == kEccEventsOfARun) return endRun(EBUSY);
   if (queue_.empty()) fill();
+  if (mode_ == Mode::Consume && !queue_.empty() && !folderLock_) {
+    auto lock = files_.lockFolder(root_.path(kFolder));
+    if (!lock) {
+      log_.write(LogLevel::Error, lock.error().message);
+      return endRun(EBUSY);
+    }
+    folderLock_ = *std::move(lock);
+  }
   while (!queue_.empty()) {
     const Event event = std::move(queue_.back());
     queue_.pop_back();
-    if (!event.bytes.empty()) return give(event.bytes, buffer);
-
+    if (!event.bytes.empty()) {
+      ++handedOut_;
+      return give(event.bytes, buffer);
+    }
     const std::string path = root_.path(kFolder) + '/' + event.name;
     const auto content = files_.readIfPresent(path, limits::kSystemFactBytes);
     if (content && !*content) continue;  // another process took it
@@ -96,17 +107,32 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
                              : content.error().message);
       continue;
     }
-    if (mode_ == Mode::Consume) {
-      // An event that stayed would be read again and again.
-      if (Status removed = files_.remove(path); !removed) {
-        log_.write(LogLevel::Error, removed.error().message);
-        return {EIO, 0};
-      }
+    if (mode_ == Mode::Consume) unfiled_ = path;
+    if (error != 0) {
+      filed();
+      return endRun(error);
     }
-    if (error != 0) return {error, 0};
+    ++handedOut_;
     return give(**content, buffer);
   }
-  return {ENOENT, 0};
+  return endRun(ENOENT);
+}
+
+// An event that cannot be removed counts as not filed, so that this run does not see it again.
+void EccEvents::filed() {
+  if (unfiled_.empty()) return;
+  if (Status removed = files_.remove(unfiled_); !removed) {
+    return log_.write(LogLevel::Error, removed.error().message);
+  }
+  unfiled_.clear();
+}
+
+SystemControls::Result EccEvents::endRun(int errorNumber) {
+  handedOut_ = 0;
+  unfiled_.clear();
+  folderLock_.reset();
+  if (mode_ == Mode::Consume) queue_.clear();
+  return {errorNumber, 0};
 }
 
 void EccEvents::setAside(const std::string& path, std::string_view fault) {

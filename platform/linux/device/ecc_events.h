@@ -3,8 +3,13 @@
 //
 // "NAME.event" holds one event of 72 bytes: the event's identifier and its count of registers (a
 // byte each), 6 bytes that are not read, and 8 registers of 64 bits in little-endian order.
-// "NAME.errno" holds the decimal number of an error with which one read fails. Each read takes the
-// first file in the order of names and removes it. Files with other names are ignored.
+// "NAME.errno" holds the decimal number of an error with which one read fails. They are taken in
+// the order of their names. Files of other names are left alone.
+//
+// An event is removed once `filed` says that its record is safe, an error with its read. A run of
+// reads ends with the first that fails. It gives ten events at most, and none after one that was
+// not filed: the read that follows fails with EBUSY and removes nothing. The folder is locked from
+// a run's first event to its end, so that no other process hands out the same ones.
 //
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
 // identifier 1 for corrected and 2 for uncorrected errors, with the number of the memory
@@ -20,6 +25,7 @@
 #include <vector>
 
 #include "base/plist.h"
+#include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/property_list_coding.h"
@@ -30,6 +36,9 @@ namespace tavrel {
 
 inline constexpr std::size_t kEccEventBytes = 72;
 
+/// The most events that one run of reads is given.
+inline constexpr int kEccEventsOfARun = 10;
+
 class EccEvents {
  public:
   /// `Peek` yields the same events without removing or publishing any.
@@ -39,9 +48,12 @@ class EccEvents {
             SystemLog& log, Mode mode)
       : root_(root), files_(files), propertyLists_(propertyLists), log_(log), mode_(mode) {}
 
-  /// Takes the next event. ENOENT when there is none, ENOMEM when it does not fit; `buffer` then
-  /// stays unchanged.
+  /// Hands the next event out. ENOENT when there is none, EBUSY when it has to wait for another
+  /// run, ENOMEM when it does not fit; `buffer` is then left alone.
   SystemControls::Result next(MutableByteSpan buffer);
+
+  /// Removes the event that was handed out last: its record is on storage.
+  void filed();
 
  private:
   struct Event {
@@ -49,6 +61,7 @@ class EccEvents {
     std::string bytes;  // empty when they are in the file
   };
 
+  SystemControls::Result endRun(int errorNumber);
   void fill();
   /// Moves an unusable file out of the way, or says that it would.
   void setAside(const std::string& path, std::string_view fault);
@@ -69,6 +82,9 @@ class EccEvents {
   Mode mode_;
   std::vector<Event> queue_;  // the next one last; empty: look again
   bool hasLooked_ = false;
+  int handedOut_ = 0;      // in this run
+  std::string unfiled_;    // the file of the event that was handed out last; empty: it was filed
+  Descriptor folderLock_;  // held during a run
 };
 
 }  // namespace tavrel

@@ -31,12 +31,12 @@ std::array<std::byte, kSwapUsageBytes> swapUsageRecord(std::uint64_t total, std:
 class LinuxSystemControls final : public SystemControls {
  public:
   LinuxSystemControls(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
-                      SystemLog& log, EccEvents::Mode eccMode = EccEvents::Mode::Consume)
+                      SystemLog& log, EccEvents& eccEvents)
       : root_(root),
         files_(files),
         propertyLists_(propertyLists),
         log_(log),
-        eccEvents_(root, files, propertyLists, log, eccMode) {}
+        eccEvents_(eccEvents) {}
 
   /// `buffer` keeps its content on failure.
   Result read(std::string_view name, MutableByteSpan buffer) override;
@@ -49,7 +49,7 @@ class LinuxSystemControls final : public SystemControls {
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
   std::optional<plist::Dictionary> recorded_;
-  EccEvents eccEvents_;
+  EccEvents& eccEvents_;
 };
 
 }  // namespace tavrel

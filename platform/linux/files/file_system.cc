@@ -95,38 +95,6 @@ Status NewFile::commit() {
   return fileSystem_.syncFolderOf(path_);
 }
 
-// -- Files that grow ------------------------------------------------------------------------------
-
-Status AppendedFile::append(ByteSpan bytes, std::size_t largest) {
-  std::string line;
-  char last = '\n';
-  if (size_ > 0 && !isLineEnded_ &&
-      pread(descriptor_.get(), &last, 1, static_cast<off_t>(size_ - 1)) == 1 && last != '\n') {
-    line = '\n';
-    line += asText(bytes);
-    bytes = asBytes(line);
-  }
-  if (bytes.size() > largest || size_ > largest - bytes.size()) {
-    return Error{"cannot append to " + path_ + ": it may have " + std::to_string(largest) +
-                 " bytes"};
-  }
-  if (Status written = fileSystem_->writeAll(descriptor_.get(), bytes, path_); !written) {
-    fileSystem_->truncateFile(descriptor_.get(), static_cast<off_t>(size_));
-    struct stat status {};
-    if (fstat(descriptor_.get(), &status) == 0) size_ = static_cast<std::uint64_t>(status.st_size);
-    isLineEnded_ = false;
-    return written;
-  }
-  size_ += bytes.size();
-  isLineEnded_ = !bytes.empty() && bytes.back() == std::byte{'\n'};
-  return Done{};
-}
-
-Status AppendedFile::flush() {
-  if (fileSystem_->syncFile(descriptor_.get()) != 0) return systemError("flush", path_);
-  return fileSystem_->syncFolderOf(path_);
-}
-
 // -- Reading ------------------------------------------------------------------------------------
 
 Expected<std::optional<std::string>> FileSystem::readIfPresent(const std::string& path,
@@ -216,13 +184,14 @@ Expected<NewFile> FileSystem::create(const std::string& path, mode_t mode) {
     if (fstat(descriptor.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
       removeStaleTemporaries(folder, fresh);
     }
-    // Owner first: changing the owner clears set-user bits of the mode.
+    // Owner first: giving a file away takes set-user bits from its mode.
+    const mode_t withheld = S_IRWXO & ~mode;
     if (const auto former = status(path); former && S_ISREG(former->st_mode)) {
       if ((former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) &&
           fchown(descriptor.get(), former->st_uid, former->st_gid) != 0) {
         // Only root can do this; others own the new file.
       }
-      if (fchmod(descriptor.get(), former->st_mode & 07777U) != 0) {
+      if (fchmod(descriptor.get(), former->st_mode & 07777U & ~withheld) != 0) {
         const Error error = systemError("set the mode of", path);
         removeFile(temporary.c_str());
         return error;
@@ -256,8 +225,9 @@ Expected<AppendedFile> FileSystem::openToAppend(const std::string& path, mode_t 
   struct stat status {};
   if (fstat(descriptor->get(), &status) != 0) return systemError("write", path);
   if (!S_ISREG(status.st_mode)) return notRegular(path, status.st_mode);
-  return AppendedFile(*this, path, *std::move(descriptor),
-                      static_cast<std::uint64_t>(status.st_size));
+  AppendedFile file(*this, path, *std::move(descriptor));
+  if (Status cut = file.cutTornEnd(status.st_size); !cut) return cut.error();
+  return file;
 }
 
 Status FileSystem::rename(const std::string& from, const std::string& to) {
@@ -291,6 +261,13 @@ Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, 0600);
   if (!descriptor) return descriptor;
   if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
+  return descriptor;
+}
+
+Expected<Descriptor> FileSystem::lockFolder(const std::string& path) {
+  Descriptor descriptor(openFile(path.c_str(), O_RDONLY | O_DIRECTORY, 0));
+  if (!descriptor) return systemError("lock", path);
+  if (Status locked = lock(descriptor.get(), path); !locked) return locked.error();
   return descriptor;
 }
 

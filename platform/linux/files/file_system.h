@@ -62,30 +62,31 @@ class NewFile {
   bool flushed_ = false;
 };
 
-/// A file that grows by whole entries. Its lock is held until the handle is released; other
-/// appenders wait, readers do not.
+/// A file that grows by whole lines. It is locked until the handle is released, so that whoever
+/// appends in the same way waits; reading goes on.
 class AppendedFile {
  public:
-  /// Appends `bytes` with one write, which survives the end of the process but not a power cut.
-  /// When they do not fit, none of them stays. A last line that a power cut left unfinished first
-  /// gets its end. The file does not grow beyond `largest` bytes.
-  Status append(ByteSpan bytes, std::size_t largest);
-  /// Flushes the file and its name to storage.
+  /// Appends lines in one write, which survives the end of the process but not of the power. When
+  /// they do not fit, nothing of them is left. Nothing is appended beyond `largest` bytes.
+  Status append(ByteSpan lines, std::size_t largest);
+  /// Writes what was appended, and the file's name, through to storage.
   Status flush();
 
  private:
   friend class FileSystem;
-  AppendedFile(FileSystem& fileSystem, std::string path, Descriptor descriptor, std::uint64_t size)
-      : fileSystem_(&fileSystem),
-        path_(std::move(path)),
-        descriptor_(std::move(descriptor)),
-        size_(size) {}
+  AppendedFile(FileSystem& fileSystem, std::string path, Descriptor descriptor)
+      : fileSystem_(&fileSystem), path_(std::move(path)), descriptor_(std::move(descriptor)) {}
+  Status cutTornEnd(std::int64_t size);
+  /// Cuts off what stands behind the whole lines.
+  Status mend();
 
   FileSystem* fileSystem_;
   std::string path_;
   Descriptor descriptor_;
-  std::uint64_t size_;
-  bool isLineEnded_ = false;  // true when known; otherwise it must be checked
+  std::uint64_t size_ = 0;  // of the whole lines
+  bool isTorn_ = false;     // something stands behind them
+  bool isFlushed_ = false;
+  bool isNameFlushed_ = false;
 };
 
 class FileSystem {
@@ -105,11 +106,12 @@ class FileSystem {
   /// process left in the folder are removed once they are older than
   /// `limits::kTemporaryFileSeconds`.
   Expected<NewFile> create(const std::string& path, mode_t mode);
-  /// An existing file keeps its mode and owner; `mode` is for a new one.
+  /// A file that exists keeps its owner, and its mode but for what `mode` withholds from others.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Opens a file for appending; makes it and its folder when missing. Waits for another process at
-  /// most `limits::kFileLockMilliseconds`.
+  /// Opens a file to append to it; it and its folder are made when missing. What a kill or a power
+  /// cut left behind its last whole line is cut off: a line without an end, and lines of zero
+  /// bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
@@ -124,6 +126,8 @@ class FileSystem {
   /// Locks the file `path`, made when missing, until the handle is released. Waits for another
   /// process at most `limits::kFileLockMilliseconds`.
   Expected<Descriptor> lockFile(const std::string& path);
+  /// The same with a folder, which must exist.
+  Expected<Descriptor> lockFolder(const std::string& path);
 
   /// Names in a folder, sorted, without those that begin with a dot; none for a missing folder.
   Expected<std::vector<std::string>> list(const std::string& folder);

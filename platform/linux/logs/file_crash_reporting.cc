@@ -18,6 +18,7 @@ namespace {
 
 constexpr std::string_view kSupportLog = "/var/mobile/Library/Logs/NorvaneCare/support.log";
 constexpr mode_t kRecordMode = 0640;
+constexpr std::uint32_t kEccRecordType = 172;
 
 bool isFilled(const std::string& path) {
   const auto status = FileSystem::status(path);
@@ -41,15 +42,21 @@ void FileCrashReporting::FLLogStructuredData(std::uint32_t logType,
   line += ",\"record\":";
   appendJson(line, record);
   line += "}\n";
-  const Status appended = records.file->append(asBytes(line), limits::kStructuredRecordFileBytes);
-  if (!appended && !std::exchange(records.isRefusalTold, true)) {
-    log_.log(LogLevel::Error, "structured records of type %u are dropped: %s", logType,
-             appended.error().message);
+  Status filed = records.file->append(asBytes(line), limits::kStructuredRecordFileBytes);
+  if (filed && logType == kEccRecordType) filed = records.file->flush();
+  if (!filed) {
+    if (!std::exchange(records.isRefusalTold, true)) refuse(logType, filed.error());
+  } else if (logType == kEccRecordType) {
+    eccEvents_.filed();
   }
 }
 
-// A file that cannot be opened is not tried again for each record of a run, because each attempt
-// waits for its lock.
+void FileCrashReporting::refuse(std::uint32_t type, const Error& error) {
+  log_.log(LogLevel::Error, "structured records of type %u %s: %s", type,
+           type == kEccRecordType ? "wait for the next run" : "are dropped", error.message);
+}
+
+// One that cannot be opened is not tried again for each record of a run: its lock is waited for.
 FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t type,
                                                                std::int64_t day) {
   const auto known = recordFiles_.find(type);
@@ -64,8 +71,7 @@ FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t typ
   if (file) {
     records.file = *std::move(file);
   } else {
-    log_.log(LogLevel::Error, "structured records of type %u are dropped: %s", type,
-             file.error().message);
+    refuse(type, file.error());
   }
   return records;
 }

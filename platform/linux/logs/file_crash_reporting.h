@@ -2,10 +2,11 @@
 //
 // Structured records are lines of JSON in
 // /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
-// and day. A record has reached the kernel when its call returns. The clean-up that ends a day's
-// work, or the end of the process, flushes all records to storage. Until then their files are
-// locked. The support log of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is
-// rolled to support.log.1 and on to support.log.5.
+// and day. Each is with the kernel when its call returns; they are written through to storage
+// together, at the clean-up that ends a day's work or with the process; that of an ECC event at
+// once, since the event then leaves its queue. Until then their files are locked. The support log
+// of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is rolled to support.log.1
+// and on to support.log.5.
 #pragma once
 
 #include <cstdint>
@@ -16,6 +17,7 @@
 
 #include "platform/clock.h"
 #include "platform/crash_reporting.h"
+#include "platform/linux/device/ecc_events.h"
 #include "platform/linux/device/linux_system_version.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
@@ -31,8 +33,13 @@ class FileCrashReporting final : public CrashReporting {
   static constexpr int kSupportLogsKept = 5;
 
   FileCrashReporting(const DeviceRoot& root, FileSystem& files, LinuxSystemVersion& systemVersion,
-                     Clock& clock, SystemLog& log)
-      : root_(root), files_(files), systemVersion_(systemVersion), clock_(clock), log_(log) {}
+                     EccEvents& eccEvents, Clock& clock, SystemLog& log)
+      : root_(root),
+        files_(files),
+        systemVersion_(systemVersion),
+        eccEvents_(eccEvents),
+        clock_(clock),
+        log_(log) {}
   ~FileCrashReporting() override;
 
   void FLLogStructuredData(std::uint32_t logType, const plist::Dictionary& record) override;
@@ -60,6 +67,7 @@ class FileCrashReporting final : public CrashReporting {
     bool isRefusalTold = false;
   };
 
+  void refuse(std::uint32_t type, const Error& error);
   RecordFile& recordFile(std::uint32_t type, std::int64_t day);
   void flush(RecordFile& file);
   void flushRecords();
@@ -68,6 +76,7 @@ class FileCrashReporting final : public CrashReporting {
   const DeviceRoot& root_;
   FileSystem& files_;
   LinuxSystemVersion& systemVersion_;
+  EccEvents& eccEvents_;
   Clock& clock_;
   SystemLog& log_;
   std::map<std::uint32_t, RecordFile> recordFiles_;  // by type

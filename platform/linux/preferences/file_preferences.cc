@@ -14,7 +14,7 @@ namespace {
 
 constexpr std::string_view kFolder = "/var/mobile/Library/Preferences";
 constexpr std::string_view kEnding = ".plist";
-constexpr mode_t kMode = 0644;
+constexpr mode_t kMode = 0640;
 
 static_assert(Preferences::kLargestChange <= limits::kPreferenceFileBytes / 8);
 

@@ -61,8 +61,8 @@ std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
          static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
 }
 
-SqliteBatch::SqliteBatch(SqliteConnection connection, std::string path)
-    : connection_(std::move(connection)), path_(std::move(path)) {
+SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site)
+    : connection_(std::move(connection)), site_(site), kept_(site.path) {
   // A large import changes many pages.
   connection_.execute("PRAGMA cache_size = -8192");
   statements_ = std::make_unique<Statements>(connection_);
@@ -72,13 +72,39 @@ void SqliteBatch::begin() {
   if (begun_) return;
   connection_.execute("BEGIN IMMEDIATE");
   begun_ = true;
+  if (kept_.exist()) takeKeptValues();
+}
+
+void SqliteBatch::takeKeptValues() {
+  const auto values = kept_.read();
+  if (!values) return site_.log.write(LogLevel::Error, values.error().message);
+  if (values->empty()) return;
+  const auto taken = static_cast<std::uint32_t>(connection_.integer("PRAGMA application_id"));
+  const auto last = std::find_if(values->rbegin(), values->rend(),
+                                 [taken](const KeptValue& value) { return value.number == taken; });
+  for (auto value = last.base(); value != values->end(); ++value)
+    writeScalar(value->day, value->key, value->value);
+  takenNumber_ = values->back().number;
+  const std::string number = std::to_string(static_cast<std::int32_t>(*takenNumber_));
+  connection_.execute(("PRAGMA application_id = " + number).c_str());
+}
+
+// What others have kept meanwhile stays, and so does the file when its turn does not come: the next
+// batch knows by the number what it has to take in.
+void SqliteBatch::removeTakenValues() {
+  try {
+    const StoreFolderLock lock(site_.path, *site_.busy);
+    const auto values = kept_.read();
+    if (values && !values->empty() && values->back().number == takenNumber_) kept_.remove();
+  } catch (const StoreFailure&) {
+  }
 }
 
 // Closing the connection rolls an unfinished transaction back.
 SqliteBatch::~SqliteBatch() = default;
 
 Error SqliteBatch::describe(const StoreFailure& failure) const {
-  return Error{"statistics store " + path_ + ": " + failure.message};
+  return Error{site_.describe(failure)};
 }
 
 void SqliteBatch::putScalar(std::int32_t day, std::string_view key, std::int64_t value) {
@@ -254,9 +280,12 @@ void SqliteBatch::writeSeries(const SeriesName& name, std::string_view records) 
 }
 
 void SqliteBatch::finish() {
+  if (kept_.exist()) begin();
   writeScalars();
   writeDistributions();
-  if (begun_) connection_.execute("COMMIT");
+  if (!begun_) return;
+  connection_.execute("COMMIT");
+  if (takenNumber_) removeTakenValues();
 }
 
 Status SqliteBatch::commit() {

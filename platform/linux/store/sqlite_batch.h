@@ -5,9 +5,11 @@
 //   (*batch)->setScalar(day, "com.example.starts", 3);
 //   (*batch)->commit();
 //
-// Rows wait in memory up to a bound. Other writers wait from the first write until the commit, so a
-// small batch holds them up only while it commits. A batch that is not committed leaves nothing
-// behind. After a failure it can only be dropped.
+// Rows wait in memory up to a bound. From the first that is written until the commit other writers
+// wait, so that a small batch holds them up only while it is committed. A batch that is not
+// committed leaves nothing. After a failure it can only be given up.
+//
+// Values that were kept beside the store (kept_values.h) are taken in before a batch's own.
 #pragma once
 
 #include <cstdint>
@@ -19,15 +21,17 @@
 #include <vector>
 
 #include "base/expected.h"
+#include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_connection.h"
+#include "platform/linux/store/sqlite_site.h"
 #include "platform/statistics_store.h"
 
 namespace tavrel {
 
 class SqliteBatch {
  public:
-  /// Throws `StoreFailure`. `path` is for messages.
-  SqliteBatch(SqliteConnection connection, std::string path);
+  /// Throws `StoreFailure`.
+  SqliteBatch(SqliteConnection connection, const StoreSite& site);
   ~SqliteBatch();
   SqliteBatch(const SqliteBatch&) = delete;
   SqliteBatch& operator=(const SqliteBatch&) = delete;
@@ -74,6 +78,8 @@ class SqliteBatch {
   using PendingMap = std::unordered_map<SeriesName, std::unique_ptr<PendingSeries>, HashName>;
 
   void begin();
+  void takeKeptValues();
+  void removeTakenValues();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
@@ -83,7 +89,9 @@ class SqliteBatch {
   Error describe(const StoreFailure& failure) const;
 
   SqliteConnection connection_;
-  std::string path_;
+  StoreSite site_;
+  KeptValues kept_;
+  std::optional<std::uint32_t> takenNumber_;  // of the last kept values in this transaction
   std::unique_ptr<Statements> statements_;
   bool begun_ = false;
   std::vector<PendingScalar> scalars_;

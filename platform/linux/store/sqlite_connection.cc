@@ -9,6 +9,8 @@
 #include <unistd.h>
 #include <utility>
 
+#include "platform/linux/store/sqlite_index_room.h"
+
 namespace tavrel {
 namespace {
 
@@ -154,6 +156,7 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
   const int code = sqlite3_open_v2(name.c_str(), &handle_, flags, nullptr);
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
+    indexRoom_ = std::make_unique<IndexRoom>(handle_);
     sqlite3_busy_handler(handle_, waitForLock, busy_.get());
     // The file may come from anywhere, so nothing in its schema may run.
     sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
@@ -172,11 +175,14 @@ SqliteConnection::~SqliteConnection() {
 }
 
 SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
-    : handle_(std::exchange(other.handle_, nullptr)), busy_(std::move(other.busy_)) {}
+    : handle_(std::exchange(other.handle_, nullptr)),
+      busy_(std::move(other.busy_)),
+      indexRoom_(std::move(other.indexRoom_)) {}
 
 SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
   std::swap(handle_, other.handle_);
   std::swap(busy_, other.busy_);
+  std::swap(indexRoom_, other.indexRoom_);
   return *this;
 }
 

@@ -22,6 +22,8 @@ struct sqlite3_stmt;
 
 namespace tavrel {
 
+class IndexRoom;
+
 enum class StoreFault : std::uint8_t {
   Damaged,  // SQLite finds the file corrupt, or not a database
   Busy,     // another process held its lock for too long
@@ -84,6 +86,7 @@ class SqliteConnection {
  private:
   sqlite3* handle_ = nullptr;
   std::shared_ptr<BusyBudget> busy_;
+  std::unique_ptr<IndexRoom> indexRoom_;
 };
 
 class SqliteStatement {

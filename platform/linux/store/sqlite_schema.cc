@@ -2,9 +2,11 @@
 
 #include <cerrno>
 #include <cstring>
+#include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
 
+#include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/sqlite_site.h"
 
 namespace tavrel {
@@ -91,7 +93,12 @@ bool isReadable(SqliteConnection& connection) {
 
 SqliteConnection openStoreForWriting(const std::string& path,
                                      const std::shared_ptr<BusyBudget>& busy) {
-  checkIsFile(path);
+  // SQLite gives its log files the mode of the store, and would make that for everybody to read.
+  // A store that is there is not opened for this: closing it would give up SQLite's locks.
+  if (!checkIsFile(path)) {
+    const Descriptor made(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0640));
+  }
+  withholdFromOthers(path);
   SqliteConnection connection(path, SqliteConnection::Access::Create, busy);
   std::int64_t version = schemaVersion(connection);
   if (version == 0) {

@@ -39,6 +39,17 @@ std::optional<FileIdentity> FileIdentity::of(const std::string& path) {
   return FileIdentity{status.st_dev, status.st_ino};
 }
 
+void withholdFromOthers(const std::string& path) {
+  for (const char* ending : {"", "-wal", "-shm"}) {
+    const std::string file = path + ending;
+    struct stat status;
+    if (lstat(file.c_str(), &status) == 0 && S_ISREG(status.st_mode) &&
+        (status.st_mode & S_IRWXO) != 0) {
+      static_cast<void>(chmod(file.c_str(), status.st_mode & 07770));
+    }
+  }
+}
+
 StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy) {
   const std::string folder = folderOf(storePath);
   descriptor_ = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
@@ -80,6 +91,7 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
   try {
     const StoreFolderLock lock(path, *busy);
     if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
+    withholdFromOthers(path);
     const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
     // The log goes first. If the process is killed in between, the file is found damaged again; a
     // log left without its file would be taken for that of a new store.

@@ -26,8 +26,12 @@ struct FileIdentity {
   static std::optional<FileIdentity> of(const std::string& path);
 };
 
-/// Held while the store's file is created or set aside, so that only one of several processes does
-/// it. The lock is on the store's folder and ends with the process.
+/// Takes the store and its log files from all users but their owner and group, as far as they are
+/// there and belong to this user.
+void withholdFromOthers(const std::string& path);
+
+/// Held while the store's file is created or set aside, so that of several processes one does it.
+/// The lock is on the store's folder and goes with the process.
 class StoreFolderLock {
  public:
   /// Throws `StoreFailure` when the lock cannot be taken in time.

@@ -24,6 +24,7 @@ SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& pref
             leavesDamaged} {}
 
 SqliteStore::~SqliteStore() {
+  if (pending_.empty()) return;
   runGuarded(site_.log, "commit the last statistics", [this] { commit(); });
 }
 
@@ -77,24 +78,51 @@ std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
 }
 
 bool SqliteStore::commit() {
-  if (pending_.empty()) return true;
+  if (pending_.empty() && !KeptValues(site_.path).exist()) return true;
   const auto failure = attempt([this](const auto&) {
-    SqliteBatch batch(openForWriting(), site_.path);
+    SqliteBatch batch(openForWriting(), site_);
     for (const auto& [name, value] : pending_)
       batch.putScalar(name.first, name.second, value);
     batch.finish();
   });
-  if (failure) {
-    site_.tell(*failure,
-               "; " + std::to_string(pending_.size()) + " values wait for the next commit");
-    return false;
-  }
+  if (failure && !keep(*failure)) return false;
   pending_.clear();
   return true;
 }
 
-void SqliteStore::BHClientCheckpoint() {
-  commit();
+bool SqliteStore::keep(const StoreFailure& failure) {
+  if (pending_.empty()) {
+    site_.tell(failure, "; kept values wait for the next commit");
+    return true;
+  }
+  std::vector<KeptValue> values;
+  values.reserve(pending_.size());
+  for (const auto& [name, value] : pending_)
+    values.push_back({0, name.first, value, name.second});
+  const std::string count = "; " + std::to_string(values.size()) + " values ";
+  try {
+    const StoreFolderLock lock(site_.path, *site_.busy);
+    const auto dropped = KeptValues(site_.path).add(std::move(values));
+    if (!dropped) throw StoreFailure{StoreFault::Device, dropped.error().message};
+    site_.tell(failure, count + "wait for the next commit");
+    if (*dropped > 0) {
+      site_.log.log(LogLevel::Error, "%s-kept is full: the %llu earliest values are dropped",
+                    site_.path, std::uint64_t{*dropped});
+    }
+    return true;
+  } catch (const StoreFailure& obstacle) {
+    site_.tell(failure, count + "are not kept yet: " + obstacle.message);
+    return false;
+  }
+}
+
+bool SqliteStore::BHClientCheckpoint() {
+  const bool areKept = commit();
+  checkpoint();
+  return areKept;
+}
+
+void SqliteStore::checkpoint() {
   // The last process that closes the store empties its log and removes it.
   if (!FileIdentity::of(site_.path + "-wal")) return;
   const auto failure = attempt([this](const auto& identity) {
@@ -139,8 +167,8 @@ Expected<std::unique_ptr<SqliteHistory>> SqliteStore::openHistory() {
 
 Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch() {
   std::unique_ptr<SqliteBatch> batch;
-  const auto failure = attempt(
-      [&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(), site_.path); });
+  const auto failure =
+      attempt([&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(), site_); });
   if (failure) return Error{site_.describe(*failure)};
   return batch;
 }

@@ -8,8 +8,8 @@
 //   store.BHClientSetValueForScalarKey("com.example.starts", 3);
 //   store.commit();
 //
-// Each failure is one line in the system log; values that could not be committed are kept for the
-// next attempt.
+// Failures are told to the system log in one line each. Values that cannot be committed are kept in
+// a file beside the store for the next commit, or, where that fails too, in memory.
 #pragma once
 
 #include <cstdint>
@@ -47,13 +47,13 @@ class SqliteStore : public StatisticsStore {
   std::int32_t BHDaysSince1970() override;
   plist::Date dateForDaysSince1970(std::int32_t day) override;
 
-  /// When other processes keep reading or writing for the whole wait, what they still need stays in
-  /// the log; a line says so, and the next checkpoint moves it.
-  void BHClientCheckpoint() override;
+  /// When other processes are reading or writing all the time that is waited for, what they still
+  /// need stays in the log; a line says so, and the next checkpoint moves it.
+  bool BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
 
-  /// Commits the values set so far. False when they had to be kept for later.
+  /// Commits the values set so far and those that were kept. False when they are in memory only.
   bool commit();
 
   /// The store's file, under the device root.
@@ -67,6 +67,9 @@ class SqliteStore : public StatisticsStore {
 
  private:
   SqliteConnection openForWriting();
+  /// Keeps the values that a failure did not let be committed. False when they could not be kept.
+  bool keep(const StoreFailure& failure);
+  void checkpoint();
   std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);
 
   /// Runs `operation` with the identity of the store's file. When it finds the store damaged, sets

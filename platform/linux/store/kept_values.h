@@ -1,0 +1,45 @@
+// Scalars that could not be committed, in a file beside the store until a commit takes them in.
+//
+// A batch that begins to write takes the file's values in first, and removes the file once they are
+// committed. In the same transaction the store remembers, as its application id, which values it
+// has taken in: those of a file that a killed process did not come to remove are not taken in
+// twice.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/files/file_system.h"
+
+namespace tavrel {
+
+struct KeptValue {
+  std::uint32_t number;  // random; the same for all values that were kept at once
+  std::int32_t day;
+  std::int64_t value;
+  std::string key;
+};
+
+/// Those who change the file take turns by the lock on the store's folder.
+class KeptValues {
+ public:
+  explicit KeptValues(const std::string& storePath) : path_(storePath + "-kept") {}
+
+  bool exist() const { return FileSystem::status(path_).has_value(); }
+  /// In the order in which they were kept; none when there is no file.
+  Expected<std::vector<KeptValue>> read();
+  /// Adds values, whose numbers are given here, to those of the file, durably. Of more than
+  /// `limits::kKeptValueBytes` the earliest are dropped; yields how many. A damaged file is
+  /// replaced.
+  Expected<std::size_t> add(std::vector<KeptValue> values);
+  void remove() { files_.discard(path_); }
+
+ private:
+  std::string path_;
+  FileSystem files_;
+};
+
+}  // namespace tavrel
