@@ -5,8 +5,6 @@
 #include <sqlite3.h>
 #include <sys/stat.h>
 
-#include "platform/linux/store/sqlite_site.h"
-
 namespace tavrel {
 namespace {
 
@@ -74,9 +72,13 @@ bool checkIsFile(const std::string& path) {
   return true;
 }
 
+// A journal is left where another program has put the store in SQLite's older mode.
 bool hasLog(const std::string& path) {
   struct stat status;
-  return stat((path + "-wal").c_str(), &status) == 0 && status.st_size != 0;
+  for (const char* suffix : {"-wal", "-journal"}) {
+    if (stat((path + suffix).c_str(), &status) == 0 && status.st_size != 0) return true;
+  }
+  return false;
 }
 
 // True when the store has tables to read.
@@ -115,12 +117,22 @@ SqliteConnection openStoreForWriting(const std::string& path,
 }
 
 std::optional<ReadableStore> openStoreForReading(const std::string& path,
-                                                 const std::shared_ptr<BusyBudget>& busy) {
+                                                 const std::shared_ptr<BusyBudget>& busy,
+                                                 bool leavesNoTrace) {
   if (!checkIsFile(path)) return std::nullopt;
+  // Taken before the log is looked at: what a writer moves from its log into the file from here on
+  // changes the version.
+  const auto version = FileVersion::of(path);
+  const auto openLockless = [&]() -> std::optional<ReadableStore> {
+    SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
+    if (!isReadable(connection)) return std::nullopt;
+    return ReadableStore{std::move(connection), version};
+  };
+  if (leavesNoTrace && version && !hasLog(path)) return openLockless();
   try {
     SqliteConnection connection(path, SqliteConnection::Access::Read, busy);
     if (!isReadable(connection)) return std::nullopt;
-    return ReadableStore{std::move(connection), false};
+    return ReadableStore{std::move(connection), std::nullopt};
   } catch (const StoreFailure& failure) {
     // Taking part in the log needs files of its own beside the store, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
@@ -132,10 +144,8 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
                              "written: have a user who may write run 'tavrelctl stat list' once"};
     }
   }
-  // Without a log nobody is writing, and all there is stands in the file itself.
-  SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
-  if (!isReadable(connection)) return std::nullopt;
-  return ReadableStore{std::move(connection), true};
+  // Without a log all there is stands in the file itself.
+  return openLockless();
 }
 
 }  // namespace tavrel

@@ -15,13 +15,13 @@
 namespace tavrel {
 
 SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences,
-                         SystemLog& log, int busyMilliseconds, bool leavesDamaged)
+                         SystemLog& log, int busyMilliseconds, bool changesNothing)
     : site_{root.path(kStorePath),
             std::make_shared<BusyBudget>(busyMilliseconds),
             clock,
             preferences,
             log,
-            leavesDamaged} {}
+            changesNothing} {}
 
 SqliteStore::~SqliteStore() {
   runGuarded(site_.log, "commit the last statistics", [this] { commit(); });
@@ -85,8 +85,9 @@ bool SqliteStore::commit() {
     batch.finish();
   });
   if (failure) {
-    site_.tell(*failure,
-               "; " + std::to_string(pending_.size()) + " values wait for the next commit");
+    site_.tell(*failure, "; " + std::to_string(pending_.size()) +
+                             (pending_.size() == 1 ? " value waits" : " values wait") +
+                             " for the next commit");
     return false;
   }
   pending_.clear();
@@ -113,8 +114,8 @@ void SqliteStore::BHClientCheckpoint() {
 
 std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
     const std::optional<FileIdentity>& identity) {
-  return std::make_unique<SqliteHistory>(site_, identity,
-                                         openStoreForReading(site_.path, site_.busy));
+  return std::make_unique<SqliteHistory>(
+      site_, identity, openStoreForReading(site_.path, site_.busy, site_.changesNothing));
 }
 
 std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
