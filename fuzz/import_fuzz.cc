@@ -25,11 +25,11 @@ std::string written(const ImportLine& line) {
 // All lines in the form of export, then the number of lines and the reason of the end.
 std::string readIn(std::string_view stream, std::size_t block) {
   std::string out;
-  ImportParser parser;
+  ImportParser parser(0);
   const ImportParser::Sink sink = [&](const ImportLine& line) -> Status {
     if (!isExportable(line.key)) std::abort();
     const std::string text = written(line);
-    const auto again = parseImportLine(std::string_view(text).substr(0, text.size() - 1));
+    const auto again = parseImportLine(std::string_view(text).substr(0, text.size() - 1), 0);
     if (!again || again->kind != line.kind || again->day != line.day || again->key != line.key ||
         again->integer != line.integer || again->seconds != line.seconds ||
         std::bit_cast<std::uint64_t>(again->value) != std::bit_cast<std::uint64_t>(line.value)) {

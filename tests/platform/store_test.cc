@@ -157,11 +157,21 @@ TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
       [&](std::string_view, std::int32_t, std::int64_t, bool& stop) { stop = ++calls == 3; });
   EXPECT_EQ(calls, 3);
 
-  const auto held = (*store_->openHistory())->holdings();
-  ASSERT_TRUE(held);
-  EXPECT_EQ(held->days, 4);
-  EXPECT_EQ(held->firstDay, kFirstDay);
-  EXPECT_EQ(held->lastDay, kLastDay);
+  const auto wide = store_->openHistory();
+  const auto held = (*wide)->daysHeld();
+  ASSERT_TRUE(held && *held);
+  EXPECT_EQ((*held)->first, kFirstDay);
+  EXPECT_EQ((*held)->last, kLastDay);
+  const Rows ofA = {{"a", kFirstDay, 8}, {"a", kToday - 1, 7}, today[2], {"a", kLastDay, 9}};
+  for (const Rows& rows : {ofA, Rows{today[3]}, Rows{{"b", kLastDay, 10}}, Rows{today[9]}}) {
+    Rows found;
+    EXPECT_TRUE(
+        (*wide)->walkScalar(rows[0].key, kFirstDay, kLastDay,
+                            [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+                              found.push_back({std::string(key), day, value});
+                            }));
+    EXPECT_EQ(found, rows);
+  }
 
   auto batch = store_->beginBatch();
   const std::string tooLong(limits::kStoreKeyBytes + 1, 'k');
@@ -171,7 +181,8 @@ TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
   EXPECT_TRUE((*batch)->addScalar(kToday, "aa", kLargest - 2));
   EXPECT_EQ((*batch)->addScalar(kToday, "aa", 1).error().message,
             "adding 1 to 9223372036854775807 goes beyond 64 bits: set the value instead");
-  EXPECT_TRUE((*batch)->addScalar(kToday, "new", -5));
+  EXPECT_TRUE((*batch)->setScalar(kToday, "new", -9));
+  EXPECT_TRUE((*batch)->addScalar(kToday, "new", 4)) << "to what waits to be written";
   ASSERT_TRUE((*batch)->commit());
   EXPECT_EQ(scalars(*history, "new", kToday - 1, kToday), (Rows{{"new", kToday, -5}}));
   EXPECT_TRUE(log_.lines.empty()) << log_.lines[0];
@@ -351,7 +362,7 @@ TEST_F(StoreTest, ValuesOutlastALock) {
   EXPECT_TRUE(impatient->commit()) << "kept beside the store";
   EXPECT_EQ(log_.lines, (Lines{"statistics store " + store_->path() +
                                ": database is locked: try again when the process that "
-                               "holds it has finished; 1 values wait for the next commit"}));
+                               "holds it has finished; 1 value waits for the next commit"}));
   EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 2}})) << "readers do not wait for writers";
   writer->reset();
   EXPECT_TRUE(impatient->commit());
@@ -474,7 +485,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
           scalarsOfToday();
           store_->BHClientCheckpoint();
           EXPECT_EQ(log_.lines, (Lines{where + reason +
-                                       (byReader ? "" : "; 1 values wait for the next commit")}));
+                                       (byReader ? "" : "; 1 value waits for the next commit")}));
           EXPECT_EQ(contentOf(store_->path()), content);
         }
       }
@@ -544,7 +555,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   const std::string advice =
       " (Permission denied): check owner and permissions of the file and its folder";
   const std::string waits =
-      "; 1 values are not kept yet: cannot write " + store_->path() + "-kept: ";
+      "; 1 value is not kept yet: cannot write " + store_->path() + "-kept: ";
   const std::string denied = "Permission denied; run as root or as the owner of the files";
   // There is no room for a single byte more.
   const auto full = [] {
@@ -603,6 +614,40 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
     if (write(acknowledgements, ".", 1) != 1) _exit(4);
   }
   _exit(0);
+}
+
+TEST_F(StoreTest, ReadersThatChangeNothingLeaveNoTraceAndSayWhenWritersInterfered) {
+  set({{"a", kToday, 1}, {"b", kToday, 2}});
+  const auto files = [&] {
+    const auto folder = std::filesystem::path(store_->path()).parent_path();
+    return std::distance(std::filesystem::directory_iterator(folder), {});
+  };
+  SqliteStore reader(root_.root, clock_, preferences_, log_, 10'000, true);
+  int rows = 0;
+  const auto walk = [&](bool writesMeanwhile) {
+    rows = 0;
+    return (*reader.openHistory())
+        ->walkScalars("", kToday, kToday, [&](std::string_view, std::int32_t, std::int64_t, bool&) {
+          ++rows;
+          if (writesMeanwhile) return set({{"c", kToday, rows}});
+          EXPECT_EQ(files(), 1);
+        });
+  };
+  EXPECT_TRUE(walk(false));
+  EXPECT_EQ(rows, 2);
+  EXPECT_EQ(walk(true).error().message,
+            "statistics store " + store_->path() +
+                ": was written while it was read: run the command again");
+  const auto keepsTheLog = store_->openHistory();
+  ASSERT_TRUE((*keepsTheLog)->daysHeld());
+  set({{"d", kToday, 4}});
+  EXPECT_EQ(files(), 3);
+  rows = 0;
+  EXPECT_TRUE(
+      (*reader.openHistory())->walkScalars("", kToday, kToday, [&](auto, auto, auto, bool&) {
+        ++rows;
+      }));
+  EXPECT_EQ(rows, 4) << "what still stands in the log is read";
 }
 
 TEST_F(StoreTest, NothingIsLostWhenWritersAreKilled) {

@@ -6,6 +6,7 @@
 #include "fixed_clock.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/json_line.h"
+#include "platform/linux/logs/log_file_name.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/plist/coding.h"
 #include "temporary_root.h"
@@ -61,6 +62,12 @@ TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
   ASSERT_EQ(logs.size(), 2U);
   EXPECT_EQ(logs[0].name.substr(0, 29), "log-tallied-20261127T180218Z-");
   EXPECT_EQ(logs[1].name.substr(0, 36), "_.._Storage_Status-20261127T180320Z-");
+  EXPECT_EQ(parseLogFileName(logs[0].name), (LogFileName{"log-tallied", 1'795'802'538}));
+  for (const char* other : {"-20261127T180218Z-5f0c9a1e", "a-20261127T180218Z-5f0c9a1",
+                            "a-20261327T180218Z-5f0c9a1e", "a-20261127T240218Z-5f0c9a1e",
+                            "a-2026112_T180218Z-5f0c9a1e", "a_20261127T180218Z-5f0c9a1e"}) {
+    EXPECT_FALSE(parseLogFileName(other)) << other;
+  }
   EXPECT_EQ(*service.ownFiles.read(logs[0].path, kContent.size()), kContent);
   std::string metadata;
   appendJson(metadata, logs[0].metadata);

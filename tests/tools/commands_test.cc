@@ -99,6 +99,8 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
                    "flag  string      \"true\"\n"
                    "key   dictionary  {\"a\": <ff>, \"b\": [1]}\n"));
   EXPECT_EQ(device.run({"prefs", "list"}), prints("com.example.a\n"));
+  EXPECT_EQ(device.run({"prefs", "list", "com.example.b"}),
+            prints("no preferences in domain com.example.b\n"));
   EXPECT_EQ(device.run({"prefs", "delete", "com.example.a", "key"}), prints(""));
   const Outcome absent = fails(
       "no preference key in domain com.example.a: 'tavrelctl prefs "
@@ -396,8 +398,7 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
        {std::string("Submission         allowed\n"),
         std::string("Last reported day  20001 (2024-10-05)\n"),
         std::string("Last OS version    none yet\n"),
-        format("Store              %llu bytes, 1 day held: 20000 (2024-10-04)\n",
-               std::uint64_t{bytes}),
+        format("Store              %llu bytes, day 20000 (2024-10-04)\n", std::uint64_t{bytes}),
         std::string("Pending logs       1\nLast run           day 20001 (2024-10-05), outcome "
                     "unknown\n")}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;

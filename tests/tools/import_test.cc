@@ -1,9 +1,14 @@
 #include <bit>
 #include <csignal>
+#include <nlohmann/json.hpp>
 
+#include "base/format.h"
 #include "device.h"
+#include "tools/shared/tool_context.h"
+#include "tools/stat/collect.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/import_number.h"
+#include "tools/stat/value_summary.h"
 
 namespace tavrel {
 namespace {
@@ -48,12 +53,16 @@ TEST(StatImport, RefusesABadLineAndKeepsNothing) {
        "a scalar has four fields, separated by tabs: scalar, day, key, integer"},
       {"value\t1\tk\t1",
        "a value has five fields, separated by tabs: value, day, key, seconds, number"},
-      {"scalar\t2147483648\tk\t1", "not a day: 2147483648: give a 32-bit day number or YYYY-MM-DD"},
-      {"scalar\t2026-02-29\tk\t1", "not a day: 2026-02-29: give a 32-bit day number or YYYY-MM-DD"},
+      {"scalar\t2147483648\tk\t1",
+       "not a day: 2147483648: give today, yesterday, a 32-bit day number or YYYY-MM-DD"},
+      {"scalar\t2026-02-29\tk\t1",
+       "not a day: 2026-02-29: give today, yesterday, a 32-bit day number or YYYY-MM-DD"},
       {"scalar\t1\tk\xFF\t1", "a key is not UTF-8: k\\xff"},
+      {"scalar\t1\t\t1", "the key is empty"},
       {"scalar\t1\tk\t9223372036854775808", "not a 64-bit integer: 9223372036854775808"},
       {"scalar\t1\tk\t1\r", "not a 64-bit integer: 1\\x0d"},
-      {"value\t1\tk\t-1\t1", "seconds within the day are 0 to 4294967295, not: -1"},
+      {"value\t1\tk\t-1\t1", "seconds within the day are 0 to 86399, not: -1"},
+      {"value\t1\tk\t86400\t1", "seconds within the day are 0 to 86399, not: 86400"},
       {"value\t1\tk\t1\tone", "not a number: one"}};
   const TemporaryDevice device;
   ASSERT_EQ(device.run({"stat", "set", "before", "1"}).status, 0);
@@ -80,14 +89,14 @@ TEST(StatImport, ExportGivesBackWhatWasImported) {
   std::string longKey(100'000, 'k');
   std::string lines =
       "scalar\t-2147483648\tfirst\t-9223372036854775808\n"
-      "scalar\t1\t\t0\n"
+      "scalar\t1\ta\t0\n"
       "scalar\t1\tk\xC3\xA9\t1\n"
       "scalar\t2147483647\t" +
       longKey + "\t9223372036854775807\n";
   for (int i = 0; i < 3000; ++i)
     lines += "value\t1\td\t" + std::to_string(i) + "\t" + std::to_string(i) + ".25\n";
   lines +=
-      "value\t1\te\t4294967295\tnan(0x7ff0000000000001)\n"
+      "value\t1\te\t86399\tnan(0x7ff0000000000001)\n"
       "value\t1\te\t0\t-0\n"
       "value\t2\td\t0\t-inf\n";
   const TemporaryDevice device;
@@ -103,14 +112,151 @@ TEST(StatImport, ExportGivesBackWhatWasImported) {
             prints("{\n  \"format_version\": 1,\n  \"file\": \"" + other.path("/lines") +
                    "\",\n  \"scalars\": 2,\n  \"values\": 0\n}\n"));
   EXPECT_EQ(other.run({"stat", "import", "-"}, "value\t1\td\t7\t0x1p1\n").status, 0);
-  EXPECT_EQ(other.run({"stat", "list"}), prints("DAY             KIND          KEY    VALUE\n"
-                                                "1 (1970-01-02)  scalar        k          2\n"
-                                                "1 (1970-01-02)  distribution  d    1 value\n"));
+  EXPECT_EQ(other.run({"stat", "list"}), prints("DAY             KIND            VALUE  KEY\n"
+                                                "1 (1970-01-02)  scalar              2  k\n"
+                                                "1 (1970-01-02)  distribution  1 value  d\n"));
   EXPECT_EQ(other.run({"stat", "list", "d", "--json"}).out,
             "{\n  \"format_version\": 1,\n  \"scalars\": [],\n  \"distributions\": [\n    {\n"
             "      \"key\": \"d\",\n      \"day\": 1,\n      \"date\": \"1970-01-02\",\n"
             "      \"count\": 1\n    }\n  ]\n}\n");
-  EXPECT_EQ(other.run({"stat", "list", "--day", "2"}), prints(""));
+  EXPECT_EQ(other.run({"stat", "list", "--day", "2"}), prints("no statistics\n"));
+  EXPECT_EQ(other.run({"stat", "import"}, "scalar\ttoday\tt\t1\nscalar\tyesterday\tt\t2\n").status,
+            0);
+  EXPECT_TRUE(other.run({"stat", "export", "t", "--day", "yesterday"}).out.ends_with("\tt\t2\n"));
+  EXPECT_TRUE(other.run({"stat", "export", "t", "--day", "today"}).out.ends_with("\tt\t1\n"));
+}
+
+TEST(StatList, KeepsColumnsOverAnyNumberOfRowsAndStopsAtThePrefix) {
+  const TemporaryDevice device;
+  const std::string odd = "k\"\x1b\xC3\xA9";
+  std::string lines =
+      "scalar\t-2\tk1026\t-9223372036854775808\nscalar\t9\t" + odd + "\t1\nscalar\t9\tl\t3\n";
+  for (int i = 0; i < 1025; ++i)
+    lines += format("scalar\t-1\tk%04d\t%d\n", i, i);
+  ASSERT_EQ(device.run({"stat", "import"}, lines).status, 0);
+  EXPECT_EQ(device.run({"stat", "list", "k", "--day", "9"}),
+            prints("DAY             KIND    VALUE  KEY\n"
+                   "9 (1970-01-10)  scalar      1  k\"\\x1b\xC3\xA9\n"));
+  EXPECT_EQ(device.run({"stat", "list", "k", "--day", "9"}, "", 38).out,
+            "DAY             KIND    VALUE  KEY\n"
+            "9 (1970-01-10)  scalar      1  k\"\\x1b\xC3\xA9\n");
+  EXPECT_EQ(device.run({"stat", "list", "k1", "--day", "-2"}, "", 49).out,
+            "DAY              KIND                   VALUE  KEY\n"
+            "-2 (1969-12-30)  scalar  -9223372036854775808  k1026\n");
+  const std::string all = device.run({"stat", "list"}).out;
+  std::istringstream stream(all);
+  std::size_t rows = 0;
+  for (std::string line; std::getline(stream, line); ++rows) {
+    const std::size_t key = line.rfind("  ") + 2;
+    EXPECT_EQ(key, 53U) << line;
+  }
+  EXPECT_EQ(rows, 1029U);
+  EXPECT_TRUE(all.ends_with(
+      " 1  k\"\\x1b\xC3\xA9\n9 (1970-01-10)   scalar                           3  l\n"))
+      << all.substr(all.size() - 200);
+  EXPECT_EQ(nlohmann::json::parse(device.run({"stat", "list", odd, "--json"}).out)["scalars"],
+            nlohmann::json::parse("[{\"key\": \"k\\\"\\u001b\xC3\xA9\", \"day\": 9, \"date\": "
+                                  "\"1970-01-10\", \"value\": 1}]"));
+}
+
+TEST(StatShow, SaysWhatAStatisticComesTo) {
+  const TemporaryDevice device;
+  std::string lines = "scalar\t19999\tk\t-5\nscalar\t20001\tk\t7\nscalar\ttoday\tl\t1\n";
+  for (int i = 1; i <= 200; ++i)
+    lines += format("value\t%d\tk\t1\t%d\n", i <= 100 ? 20000 : 20001, 101 - i);
+  ASSERT_EQ(device
+                .run({"stat", "import"}, lines + "value\t20001\tk\t2\tnan\nvalue\t3\tw\t0\t-"
+                                                 "inf\nvalue\t3\tw\t0\t0.5\nvalue\t3\tw\t0\t0.5\n")
+                .status,
+            0);
+  EXPECT_EQ(device.run({"stat", "show", "k"}), prints(R"(Scalar k, 2 days
+
+  DAY                 VALUE
+  19999 (2024-10-03)     -5
+  20001 (2024-10-05)      7
+
+Distribution k, 2 days
+
+  Count                      201
+  Not a number                 1
+  Minimum                    -99
+  Percentile 1               -98
+  Percentile 5               -90
+  Percentile 25              -50
+  Percentile 50                0
+  Percentile 75               50
+  Percentile 95               90
+  Percentile 99               98
+  Maximum                    100
+  Mean                       0.5
+  Standard deviation  57.7343052
+
+Histogram
+  (-100, -80]  20  ########################################
+  (-80, -60]   20  ########################################
+  (-60, -40]   20  ########################################
+  (-40, -20]   20  ########################################
+  (-20, 0]     20  ########################################
+  (0, 20]      20  ########################################
+  (20, 40]     20  ########################################
+  (40, 60]     20  ########################################
+  (60, 80]     20  ########################################
+  (80, 100]    20  ########################################
+
+  DAY                 COUNT  MINIMUM  MAXIMUM   MEAN
+  20000 (2024-10-04)    100        1      100   50.5
+  20001 (2024-10-05)    101      -99        0  -49.5
+)"));
+  const auto json = nlohmann::json::parse(device.run({"stat", "show", "w", "--json"}).out);
+  EXPECT_EQ(json["scalar"], nullptr);
+  EXPECT_EQ(json["distribution"], nlohmann::json::parse(R"({
+      "count": 3, "not_a_number": 0, "minimum": {"$real": "-inf"}, "maximum": 0.5,
+      "mean": {"$real": "-inf"}, "standard_deviation": {"$real": "nan"},
+      "percentiles": {"1": {"$real": "-inf"}, "5": {"$real": "-inf"}, "25": {"$real": "-inf"},
+                      "50": 0.5, "75": 0.5, "95": 0.5, "99": 0.5},
+      "histogram": [{"bucket": "-inf", "count": 1}, {"bucket": "[0.5, 0.5]", "count": 2}],
+      "days": [{"day": 3, "date": "1970-01-04", "count": 3, "not_a_number": 0,
+                "minimum": {"$real": "-inf"}, "maximum": 0.5, "mean": {"$real": "-inf"},
+                "standard_deviation": {"$real": "nan"}}]})"));
+  EXPECT_EQ(device.run({"stat", "show", "l", "--days", "1"}).status, 0);
+  EXPECT_EQ(device.run({"stat", "show", "k", "--days", "7"}),
+            fails("no statistic k in the last 7 days: see 'tavrelctl stat list'"));
+  EXPECT_EQ(device.run({"stat", "show", "x"}), fails("no statistic x: see 'tavrelctl stat list'"));
+  EXPECT_EQ(device.run({"stat", "show", "k", "--days", "0"}).status, 2);
+}
+
+TEST(StatShow, FindsPercentilesAndBucketsOfAnyNumbers) {
+  using Case = std::tuple<std::vector<double>, std::vector<double>, std::string>;
+  constexpr int kPercents[] = {1, 50, 99};
+  for (const auto& [values, percentiles, buckets] :
+       {Case({7}, {7, 7, 7}, "[7, 7]=1 "),
+        Case({1, 2, 3, 4}, {1, 2, 4}, "(0, 1]=1 (1, 2]=1 (2, 3]=1 (3, 4]=1 "),
+        Case({-1.7e308, 0, 1.7e308}, {-1.7e308, 0, 1.7e308},
+             "(-inf, -1.5e+308]=1 (-1.5e+308, -1e+308]=0 "),
+        Case({0.1, 0.2, 0.3}, {0.1, 0.2, 0.3}, "(0.08, 0.1]=1 "),
+        Case({5e-324, 1e-323}, {5e-324, 5e-324, 1e-323},
+             "[4.94065645841247e-324, 9.88131291682493e-324]=2 ")}) {
+    Summary summary;
+    for (const double value : values)
+      summary.add(value);
+    PercentileSearch search(summary.numbers(), kPercents);
+    for (; search.needsPass(); search.endPass()) {
+      for (const double value : values)
+        search.add(value);
+    }
+    EXPECT_EQ(search.values(), percentiles);
+    RoundHistogram histogram(summary);
+    for (const double value : values)
+      histogram.add(value);
+    std::string text;
+    std::uint64_t counted = 0;
+    for (const auto& bucket : histogram.buckets()) {
+      text += bucket.label + "=" + std::to_string(bucket.count) + " ";
+      counted += bucket.count;
+    }
+    EXPECT_TRUE(text.starts_with(buckets)) << text;
+    EXPECT_EQ(counted, values.size());
+  }
 }
 
 TEST(StatCommands, SetAddAndRecordWriteToToday) {
@@ -127,6 +273,8 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   EXPECT_EQ(device.run({"stat", "record", "d", "--", "-1.5", "0x1p-1", "-inf"}), prints(""));
   EXPECT_EQ(device.run({"stat", "record", "d", "2", "x"}).status, 2);
 
+  EXPECT_EQ(device.run({"stat", "set", "", "5"}),
+            fails("not a key: \"\": give UTF-8 text without tabs and line ends", 2));
   for (const char* key : {"a\tb", "a\nb", "a\xff"}) {
     for (const char* command : {"set", "add", "record"}) {
       const Outcome refused = device.run({"stat", command, key, "1"});
@@ -149,6 +297,22 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   }
 }
 
+// Takes two seconds between readings, and changes the machine meanwhile.
+class SlowPace final : public CollectPace {
+ public:
+  explicit SlowPace(std::function<void()> change) : change_(std::move(change)) {}
+  Ticks now() override { return now_; }
+  bool endsBefore(Ticks) override {
+    now_ += std::chrono::seconds(2);
+    change_();
+    return false;
+  }
+
+ private:
+  std::function<void()> change_;
+  Ticks now_;
+};
+
 TEST(StatCommands, CollectsWhatTheMachineTells) {
   const TemporaryDevice device;
   device.write("/proc/uptime", "1234.56 99.00\n");
@@ -165,11 +329,25 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
   device.write("/sys/block/sda/device/x", "");
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
   device.write("/sys/class/thermal/thermal_zone1/temp", "30000\n");
-  const Outcome collected = device.run({"stat", "collect", "--seconds", "1"});
-  EXPECT_EQ(collected.status, 0);
-  EXPECT_EQ(collected.out, "kept 2 samples of this machine, taken over 1 second\n");
-  EXPECT_EQ(collected.error.substr(0, 60),
-            "tavrelctl: not recorded, as the machine did not tell in this");
+  SlowPace pace([&] {
+    // 100 ticks of which 30 idle and 10 waiting; 3 and 5 KiB on the network, 7 and 9 on the disk.
+    device.write("/proc/stat", "cpu  30 40 50 430 60 6 7 8 0 0\ncpu0 1\ncpu1 9\nintr 1\n");
+    device.write("/proc/net/dev",
+                 "titles\ntitles\n    lo: 99 0 0 0 0 0 0 0 99 0\n"
+                 "  eth0: 5120 0 0 0 0 0 0 0 9216 0\n eth1: garbage\n");
+    device.write("/proc/diskstats", "8 0 sda 1 1 214 1 1 1 418 1\n7 0 loop0 1 1 99 1 1 1 99 1\n");
+  });
+  std::istringstream in;
+  std::ostringstream out, error;
+  {
+    ToolContext context({.in = in, .out = out, .error = error});
+    context.setRoot(device.path(""));
+    collectStatistics(context, 1, pace);
+  }
+  EXPECT_EQ(out.str(), "kept 2 samples of this machine, taken over 1 second\n");
+  EXPECT_EQ(error.str(),
+            "tavrelctl: not recorded, as the machine did not tell in this time: "
+            "com.norvane.usage.processes\n");
 
   // Without the day, and without what the machine itself answers.
   std::istringstream lines(device.run({"stat", "export"}).out);
@@ -186,13 +364,13 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
     }
   }
   EXPECT_EQ(all,
-            "cpu.busy_milliseconds=0 cpu.count=2 disk.read_kib=0 disk.written_kib=0 "
-            "memory.available_mib=1 memory.total_mib=4 network.received_kib=0 network.sent_kib=0 "
-            "samples=2 swap.used_mib=1 uptime.seconds=1234 "
-            "disk.read_kib_per_second=0 disk.written_kib_per_second=0 "
+            "cpu.busy_milliseconds=600 cpu.count=2 disk.read_kib=7 disk.written_kib=9 "
+            "memory.available_mib=1 memory.total_mib=4 network.received_kib=3 network.sent_kib=5 "
+            "samples=2 swap.used_mib=1 uptime.seconds=1234 cpu.busy_percent=60 "
+            "disk.read_kib_per_second=3.5 disk.written_kib_per_second=4.5 "
             "load.one_minute=0.25 load.one_minute=0.25 memory.used_percent=75 "
-            "memory.used_percent=75 network.received_kib_per_second=0 "
-            "network.sent_kib_per_second=0 temperature.celsius=41.5 temperature.celsius=41.5 ");
+            "memory.used_percent=75 network.received_kib_per_second=1.5 "
+            "network.sent_kib_per_second=2.5 temperature.celsius=41.5 temperature.celsius=41.5 ");
 }
 
 TEST(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {

@@ -118,6 +118,7 @@ void listDomains(ToolContext& context) {
   const auto domains = context.preferences().domains();
   if (!domains) return context.fail(domains.error().message);
   if (context.json()) return context.printJson({{"domains", *domains}});
+  if (domains->empty()) context.out() << "no preferences\n";
   for (const std::string& domain : *domains)
     context.out() << printable(domain) << '\n';
 }
@@ -140,7 +141,11 @@ void list(ToolContext& context, const Arguments& arguments) {
     table.add({std::string(entry->key.view()), std::string(kindName(entry->value)),
                inlineText(entry->value)});
   }
-  if (!table.empty()) table.print(context.out(), context.columns());
+  if (!table.empty()) {
+    table.print(context.out(), context.columns());
+  } else if (!context.hasComplaints()) {
+    context.out() << format("no preferences in domain %s\n", arguments.domain);
+  }
 }
 
 void addKindOptions(Command command, const std::shared_ptr<Arguments>& arguments) {

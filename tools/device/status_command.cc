@@ -26,8 +26,8 @@ struct DeviceStatus {
   std::optional<std::string> osVersion;  // of the last log
   std::string storePath;
   std::optional<std::int64_t> storeBytes;  // with its write-ahead log; nothing without a store
-  Expected<SqliteHistory::Holdings> holdings = SqliteHistory::Holdings{};
-  Expected<std::vector<FileSubmission::FiledLog>> pending = Error{};
+  Expected<std::optional<SqliteHistory::DaySpan>> days = std::optional<SqliteHistory::DaySpan>();
+  Expected<std::size_t> pending = 0;
   LogConclusion conclusion;
 };
 
@@ -60,12 +60,16 @@ DeviceStatus takeStatus(ToolContext& context) {
   if (status.storeBytes) {
     const auto history = context.storeForReading().openHistory();
     if (history) {
-      status.holdings = (*history)->holdings();
+      status.days = (*history)->daysHeld();
     } else {
-      status.holdings = history.error();
+      status.days = history.error();
     }
   }
-  status.pending = device.submission().logs(FileSubmission::Place::Pending);
+  if (const auto files = device.submission().files(FileSubmission::Place::Pending)) {
+    status.pending = files->size();
+  } else {
+    status.pending = files.error();
+  }
   if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
 }
@@ -76,14 +80,11 @@ Json jsonOfDay(std::optional<std::int32_t> day) {
 }
 
 void printJson(ToolContext& context, const DeviceStatus& status) {
-  Json store = {{"path", status.storePath}, {"bytes", nullptr}, {"days", nullptr}};
+  Json store = {{"path", status.storePath}, {"bytes", nullptr}, {"first_day", nullptr}, {"last_day", nullptr}};
   if (status.storeBytes) store["bytes"] = *status.storeBytes;
-  if (status.holdings) {
-    store["days"] = status.holdings->days;
-    if (status.holdings->days > 0) {
-      store["first_day"] = jsonOfDay(status.holdings->firstDay);
-      store["last_day"] = jsonOfDay(status.holdings->lastDay);
-    }
+  if (status.days && *status.days) {
+    store["first_day"] = jsonOfDay((*status.days)->first);
+    store["last_day"] = jsonOfDay((*status.days)->last);
   }
   context.printJson(
       {{"submission_allowed",
@@ -92,19 +93,18 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
        {"last_reported_day", jsonOfDay(status.lastDay)},
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
        {"store", std::move(store)},
-       {"pending_logs", status.pending ? Json(status.pending->size()) : Json(nullptr)},
+       {"pending_logs", status.pending ? Json(*status.pending) : Json(nullptr)},
        {"conclusion", status.isStateReadable ? status.conclusion.json() : Json(nullptr)}});
 }
 
 std::string storeText(const DeviceStatus& status) {
   if (!status.storeBytes) return "none yet";
   std::string text = format("%lld bytes", *status.storeBytes);
-  if (!status.holdings) return text + ", unreadable";
-  const SqliteHistory::Holdings& held = *status.holdings;
-  if (held.days == 0) return text + ", empty";
-  if (held.days == 1) return text + format(", 1 day held: %s", dayText(held.firstDay));
-  return text + format(", %lld days held: %s to %s", held.days, dayText(held.firstDay),
-                       dayText(held.lastDay));
+  if (!status.days) return text + ", unreadable";
+  if (!*status.days) return text + ", empty";
+  const auto [first, last] = **status.days;
+  if (first == last) return text + format(", day %s", dayText(first));
+  return text + format(", days %s to %s", dayText(first), dayText(last));
 }
 
 void printText(ToolContext& context, const DeviceStatus& status) {
@@ -120,8 +120,7 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   table.add({"Last OS version", status.osVersion.value_or(none)});
   table.add({"Store", storeText(status)});
   table.add({"Store file", status.storePath});
-  table.add(
-      {"Pending logs", status.pending ? std::to_string(status.pending->size()) : "unreadable"});
+  table.add({"Pending logs", status.pending ? std::to_string(*status.pending) : "unreadable"});
   table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
              status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
   table.print(context.out(), std::nullopt);
@@ -140,7 +139,7 @@ void addStatusCommand(Command app, ToolContext& context) {
       printText(context, status);
     }
     if (context.hasComplaints()) context.setExitStatus(kExitFailure);
-    if (!status.holdings) context.fail(status.holdings.error().message);
+    if (!status.days) context.fail(status.days.error().message);
     if (!status.pending) context.fail(status.pending.error().message);
   });
 }

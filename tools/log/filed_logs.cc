@@ -8,21 +8,44 @@
 #include "base/limits.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/log_file_name.h"
 #include "platform/plist/coding.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
 
-// The order in which logs were filed: metadata has the second, the file the rest.
+// The second in which a log was filed, since 1970; without metadata it counts as the oldest.
+double secondOf(const FiledLog& log) {
+  const auto time = log.metadata.date(kLogMetadataTime);
+  return time ? std::floor(time->secondsSince1970()) : -HUGE_VAL;
+}
+
+// The order in which logs were filed. Metadata tells the second, the file the rest.
 bool isOlder(const FiledLog& a, const FiledLog& b) {
   const auto order = [](const FiledLog& log) {
-    const auto time = log.metadata.date(kLogMetadataTime);
     const timespec modified = log.status ? log.status->st_mtim : timespec{};
-    return std::tuple(time ? std::floor(time->secondsSinceEpoch()) : -HUGE_VAL, modified.tv_sec,
-                      modified.tv_nsec);
+    return std::tuple(secondOf(log), modified.tv_sec, modified.tv_nsec);
   };
   return order(a) < order(b);
+}
+
+// False for a folder, whatever its name. Takes the status.
+bool isRegular(FiledLog& log) {
+  log.status = FileSystem::status(log.path);
+  return !log.status || S_ISREG(log.status->st_mode);
+}
+
+// The logs of both folders as their names tell them.
+Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
+  std::vector<FiledLog> logs;
+  for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
+    auto found = context.linuxPlatform().submission().files(place);
+    if (!found) return found.error();
+    for (FileSubmission::FiledLog& log : *found)
+      logs.push_back({std::move(log), std::nullopt});
+  }
+  return logs;
 }
 
 }  // namespace
@@ -36,19 +59,60 @@ std::string fileNameOf(const FiledLog& log) {
 }
 
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context) {
-  FileSubmission& submission = context.linuxPlatform().submission();
-  std::vector<FiledLog> logs;
-  for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
-    auto found = submission.logs(place);
-    if (!found) return found.error();
-    for (FileSubmission::FiledLog& log : *found) {
-      auto status = FileSystem::status(log.path);
-      if (status && !S_ISREG(status->st_mode)) continue;
-      logs.push_back({std::move(log), status});
-    }
-  }
-  std::stable_sort(logs.begin(), logs.end(), isOlder);
+  auto logs = filesOfLogs(context);
+  if (!logs) return logs;
+  std::erase_if(*logs, [](FiledLog& log) { return !isRegular(log); });
+  for (FiledLog& log : *logs)
+    context.linuxPlatform().submission().readMetadata(log);
+  std::stable_sort(logs->begin(), logs->end(), isOlder);
   return logs;
+}
+
+Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
+                                            const std::function<bool(const FiledLog&)>& accepts) {
+  FileSubmission& submission = context.linuxPlatform().submission();
+  auto files = filesOfLogs(context);
+  if (!files) return files.error();
+  std::vector<std::pair<double, FiledLog>> candidates;
+  for (FiledLog& log : *files) {
+    const auto known = parseLogFileName(log.name);
+    if (!known) submission.readMetadata(log);
+    const std::string_view logName =
+        known ? known->logName : log.metadata.string(kLogMetadataName).value_or(log.name);
+    if (!logName.starts_with(namePrefix)) continue;
+    const double second = known ? static_cast<double>(known->seconds) : secondOf(log);
+    candidates.emplace_back(second, std::move(log));
+  }
+  std::stable_sort(candidates.begin(), candidates.end(),
+                   [](const auto& a, const auto& b) { return a.first < b.first; });
+  while (!candidates.empty()) {
+    const auto sameSecond =
+        std::find_if(candidates.begin(), candidates.end(),
+                     [&](const auto& entry) { return entry.first == candidates.back().first; });
+    std::vector<FiledLog> newest;
+    for (auto entry = sameSecond; entry != candidates.end(); ++entry) {
+      if (!isRegular(entry->second)) continue;
+      submission.readMetadata(entry->second);
+      newest.push_back(std::move(entry->second));
+    }
+    candidates.erase(sameSecond, candidates.end());
+    std::stable_sort(newest.begin(), newest.end(), isOlder);
+    const auto found = std::find_if(newest.rbegin(), newest.rend(), accepts);
+    if (found != newest.rend()) return std::optional(std::move(*found));
+  }
+  return std::optional<FiledLog>();
+}
+
+std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name) {
+  auto files = filesOfLogs(context);
+  if (!files) return std::nullopt;
+  // One that stands in both folders, as after a power cut, still waits.
+  const auto found = std::find_if(files->rbegin(), files->rend(), [&](FiledLog& log) {
+    return (name == log.path || name == log.name || name == fileNameOf(log)) && isRegular(log);
+  });
+  if (found == files->rend()) return std::nullopt;
+  context.linuxPlatform().submission().readMetadata(*found);
+  return std::move(*found);
 }
 
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs) {

@@ -1,6 +1,7 @@
 // Lists the logs that were filed for submission.
 #pragma once
 
+#include <functional>
 #include <optional>
 #include <string>
 #include <string_view>
@@ -26,7 +27,15 @@ std::string fileNameOf(const FiledLog& log);
 /// The logs of both folders, oldest first.
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context);
 
-/// Says once why logs have no metadata.
+/// The newest log whose name begins with `namePrefix` and that `accepts` takes, chosen by the names
+/// of files: metadata is read of few. Nothing when there is none.
+Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
+                                            const std::function<bool(const FiledLog&)>& accepts);
+
+/// The filed log that `name` means: its path, or the name of its file with or without the ending.
+std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);
+
+/// Says once why logs stand without metadata.
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs);
 
 }  // namespace tavrel

@@ -63,31 +63,25 @@ void list(ToolContext& context) {
   noteMissingMetadata(context, *logs);
 }
 
-bool isDaily(const FiledLog& log) {
-  return log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName);
-}
-
 /// The log that `name` means: "latest" (of the daily logs), the name of a filed log, or a path of
 /// this machine.
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
-  const auto logs = filedLogs(context);
-  const bool isLatest = name == "latest";
-  if (!logs && isLatest) return logs.error();
-  if (logs) {
-    for (auto log = logs->rbegin(); log != logs->rend(); ++log) {
-      if ((isLatest && isDaily(*log)) || name == log->path || name == log->name ||
-          name == fileNameOf(*log)) {
-        return LogEnvelope{std::string(nameOf(log->place)), log->path, log->metadata};
-      }
+  std::optional<FiledLog> found;
+  if (name == "latest") {
+    auto latest = newestLog(context, kTalliedLogName, [](const FiledLog&) { return true; });
+    if (!latest) return latest.error();
+    if (!*latest) {
+      const LogConclusion conclusion = concludeOnLogs(context);
+      return Error{format(
+          "no daily log is here; %s run: %s; 'tavrelctl log preview' shows what a log would hold",
+          conclusion.run(), conclusion.text())};
     }
+    found = std::move(*latest);
+  } else {
+    found = filedLogNamed(context, name);
   }
-  if (isLatest) {
-    const LogConclusion conclusion = concludeOnLogs(context);
-    return Error{format(
-        "no daily log is here; %s run: %s; 'tavrelctl log preview' shows what a log would hold",
-        conclusion.run(), conclusion.text())};
-  }
-  return LogEnvelope{"file", name, {}};
+  if (!found) return LogEnvelope{"file", name, {}};
+  return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
 }
 
 // Logs of other kinds are texts with their own form.

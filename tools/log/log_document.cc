@@ -18,8 +18,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::size_t kPlainDigits = 10;
-
 void printField(std::ostream& out, std::string_view name, std::string_view text) {
   out << format("%-12s  ", name) << printable(text) << '\n';
 }
@@ -45,12 +43,6 @@ std::optional<std::int32_t> dayOf(const plist::Dictionary& log) {
   const double day = std::floor(start->secondsSince1970() / 86400.0);
   if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
   return static_cast<std::int32_t>(day);
-}
-
-// Long fractions are for programs; people get ten digits.
-std::string shortNumber(double value) {
-  const std::string exact = numberText(value);
-  return exact.size() <= kPlainDigits ? exact : format("%.9g", value);
 }
 
 void printValues(std::ostream& out, std::string_view title, const plist::Dictionary& values,

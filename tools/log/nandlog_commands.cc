@@ -189,16 +189,16 @@ void print(ToolContext& context, const LogEnvelope& envelope, const NandLog& log
 }
 
 void show(ToolContext& context) {
-  const auto logs = filedLogs(context);
-  if (!logs) return context.fail(logs.error().message);
-  const auto newest = std::find_if(logs->rbegin(), logs->rend(), [](const FiledLog& log) {
+  const auto found = newestLog(context, kNandLogName, [](const FiledLog& log) {
     return log.metadata.string(kLogMetadataName) == kNandLogName &&
            log.metadata.string(kLogMetadataType) == kNandLogType;
   });
+  if (!found) return context.fail(found.error().message);
+  const std::optional<FiledLog>& newest = *found;
   const NextLog next = nextLog(context);
   Json document = {{"log", nullptr}, {"next", jsonOf(next)}};
   std::string fault;
-  if (newest == logs->rend()) {
+  if (!newest) {
     fault = "no NAND log waits or was sent on: one is written when the write amplification is high";
   } else {
     const LogEnvelope envelope{std::string(nameOf(newest->place)), newest->path, newest->metadata};

@@ -91,9 +91,13 @@ void list(ToolContext& context, const Arguments&) {
     }
   }
   if (context.json()) return context.printJson({{"services", std::move(services)}});
-  if (table.empty())
-    return context.note("no drivers: recordings of them belong in " +
-                        context.root().path("/var/lib/tavrel/registry"));
+  if (table.empty()) {
+    // Recordings that cannot be read have been complained of.
+    if (context.hasComplaints()) return;
+    context.out() << "no drivers: recordings of them belong in "
+                  << printable(context.root().path("/var/lib/tavrel/registry")) << '\n';
+    return;
+  }
   table.print(context.out(), context.columns());
 }
 

@@ -102,7 +102,10 @@ void list(ToolContext& context, const Arguments& arguments) {
     addChannels(list, *channels);
     return list.end();
   }
-  if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
+  if (IOReportGetChannelCount(*channels) == 0) {
+    if (!noting.hasErrors() && !noting.hasPrinted()) context.out() << "no channels\n";
+    return;
+  }
   printChannels(context.out(), *channels, arguments.flat, context.columns());
 }
 

@@ -5,6 +5,7 @@
 #include <ostream>
 #include <vector>
 
+#include "base/format.h"
 #include "base/text.h"
 #include "tools/shared/table.h"
 
@@ -112,6 +113,12 @@ void printOutline(std::ostream& out, const plist::Value& value, std::size_t inde
   const auto dictionary = value.dictionary();
   for (const auto& [key, member] : sortedMembers(dictionary))
     printMember(out, printable(key), *member, indent);
+}
+
+std::string shortNumber(double value) {
+  constexpr std::size_t kPlainDigits = 10;
+  const std::string exact = numberText(value);
+  return exact.size() <= kPlainDigits ? exact : format("%.9g", value);
 }
 
 }  // namespace tavrel

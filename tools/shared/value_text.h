@@ -20,6 +20,10 @@ std::string kindWithArticle(const plist::Value& value);
 /// <0102>, [1, {"key": 2}] with sorted keys.
 std::string inlineText(const plist::Value& value);
 
+/// A number of at most ten digits and no more than nine significant ones when it has a fraction:
+/// long fractions are for programs.
+std::string shortNumber(double value);
+
 /// A value over several lines, the content of containers indented by two blanks per level. Keys
 /// are sorted.
 void printOutline(std::ostream& out, const plist::Value& value, std::size_t indent = 0);

@@ -23,7 +23,7 @@
 namespace tavrel {
 namespace {
 
-using Ticks = std::chrono::steady_clock::time_point;
+using Ticks = CollectPace::Ticks;
 
 constexpr std::size_t kReadingsPerTransaction = 60;
 
@@ -169,12 +169,12 @@ class Collector {
  public:
   explicit Collector(ToolContext& context) : context_(context) {}
 
-  void read() {
+  void read(Ticks at) {
     Platform& platform = context_.platform();
     const auto now = saturatingInt64(std::floor(platform.clock->now().secondsSince1970()));
     const std::int64_t secondsInDay = (now % kSecondsPerDay + kSecondsPerDay) % kSecondsPerDay;
     readings_.push_back({platform.statistics->BHDaysSince1970(),
-                         static_cast<std::uint32_t>(secondsInDay), std::chrono::steady_clock::now(),
+                         static_cast<std::uint32_t>(secondsInDay), at,
                          readMachine(context_.root())});
     ++count_;
   }
@@ -247,8 +247,8 @@ class Collector {
   bool told_[std::size(kStatistics)] = {};
 };
 
-// Holds SIGINT and SIGTERM back while it lives, so that samples are kept when they arrive.
-class EndSignals {
+// Holds SIGINT and SIGTERM back while it lives, so that what was sampled is kept when they come.
+class EndSignals final : public CollectPace {
  public:
   EndSignals() {
     sigemptyset(&signals_);
@@ -256,17 +256,20 @@ class EndSignals {
     sigaddset(&signals_, SIGTERM);
     pthread_sigmask(SIG_BLOCK, &signals_, &before_);
   }
-  ~EndSignals() {
-    // A signal that has arrived meanwhile asked for this end.
-    while (arriveBefore(Ticks())) {
+  ~EndSignals() override {
+    // One that came meanwhile asked for the end that this is.
+    while (waitForOne(Ticks())) {
     }
     pthread_sigmask(SIG_SETMASK, &before_, nullptr);
   }
   EndSignals(const EndSignals&) = delete;
   EndSignals& operator=(const EndSignals&) = delete;
 
-  /// Waits until `end`; true at once when one of the signals has arrived.
-  bool arriveBefore(Ticks end) const {
+  Ticks now() override { return std::chrono::steady_clock::now(); }
+  bool endsBefore(Ticks end) override { return waitForOne(end); }
+
+ private:
+  bool waitForOne(Ticks end) const {
     for (;;) {
       const auto left = std::max(end - std::chrono::steady_clock::now(), Ticks::duration::zero());
       const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
@@ -277,26 +280,23 @@ class EndSignals {
     }
   }
 
- private:
   sigset_t signals_;
   sigset_t before_;
 };
 
 }  // namespace
 
-void collectStatistics(ToolContext& context, std::uint32_t seconds) {
+void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace& pace) {
   Collector collector(context);
-  const Ticks start = std::chrono::steady_clock::now();
-  const EndSignals signals;
+  const Ticks start = pace.now();
   std::uint32_t second = 0;
   bool endsEarly = false;
   {
     StatProgress progress(context);
     for (;; ++second) {
-      collector.read();
+      collector.read(pace.now());
       progress.show(format("collecting: %u of %u seconds", second, seconds));
-      endsEarly =
-          second < seconds && signals.arriveBefore(start + std::chrono::seconds(second + 1));
+      endsEarly = second < seconds && pace.endsBefore(start + std::chrono::seconds(second + 1));
       const bool isLast = second == seconds || endsEarly;
       if (!isLast && collector.waiting() < kReadingsPerTransaction) continue;
       if (const Status kept = collector.keep(); !kept) return context.fail(kept.error().message);
@@ -310,6 +310,11 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
   if (const std::string keys = collector.missing(); collector.count() > 1 && !keys.empty()) {
     context.note("not recorded, as the machine did not tell in this time:" + keys);
   }
+}
+
+void collectStatistics(ToolContext& context, std::uint32_t seconds) {
+  EndSignals signals;
+  collectStatistics(context, seconds, signals);
 }
 
 std::string_view collectedKeysHelp() {

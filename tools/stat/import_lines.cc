@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <charconv>
 
+#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/utf8.h"
@@ -60,7 +61,7 @@ void appendStart(std::string& out, std::string_view kind, std::int32_t day, std:
 
 }  // namespace
 
-Expected<ImportLine> parseImportLine(std::string_view line) {
+Expected<ImportLine> parseImportLine(std::string_view line, std::int32_t today) {
   if (line.empty()) return Error{"the line is empty"};
   ImportLine result;
   std::string_view rest = line;
@@ -81,9 +82,10 @@ Expected<ImportLine> parseImportLine(std::string_view line) {
                           : "a value has five fields, separated by tabs: value, day, key, seconds, "
                             "number"};
   }
-  const auto parsedDay = parseDay(day);
+  const auto parsedDay = parseDay(day, today);
   if (!parsedDay) return parsedDay.error();
   result.day = *parsedDay;
+  if (result.key.empty()) return Error{"the key is empty"};
   if (result.key.size() > limits::kStoreKeyBytes) {
     return Error{format("a key of %zu bytes: the longest allowed has %zu", result.key.size(),
                         limits::kStoreKeyBytes)};
@@ -96,8 +98,8 @@ Expected<ImportLine> parseImportLine(std::string_view line) {
     }
     return result;
   }
-  if (!parseInteger(seconds, result.seconds)) {
-    return Error{format("seconds within the day are 0 to 4294967295, not: %s", shortened(seconds))};
+  if (!parseInteger(seconds, result.seconds) || result.seconds >= kSecondsPerDay) {
+    return Error{format("seconds within the day are 0 to 86399, not: %s", shortened(seconds))};
   }
   const auto value = parseExactDouble(rest);
   if (!value) return value.error();
@@ -107,7 +109,7 @@ Expected<ImportLine> parseImportLine(std::string_view line) {
 
 Status ImportParser::takeLine(std::string_view line, const Sink& sink) {
   ++lines_;
-  const auto parsed = parseImportLine(line);
+  const auto parsed = parseImportLine(line, today_);
   if (!parsed) return parsed.error();
   return sink(*parsed);
 }
@@ -140,7 +142,7 @@ Status ImportParser::finish(const Sink& sink) {
 }
 
 bool isExportable(std::string_view key) {
-  return key.find_first_of("\t\n") == std::string_view::npos && isUtf8(key);
+  return !key.empty() && key.find_first_of("\t\n") == std::string_view::npos && isUtf8(key);
 }
 
 void appendScalarLine(std::string& out, std::int32_t day, std::string_view key,

@@ -3,8 +3,9 @@
 //   scalar<TAB>DAY<TAB>KEY<TAB>INTEGER
 //   value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE
 //
-// A day is the number of days since 1970-01-01 or YYYY-MM-DD; a key is UTF-8 without tabs or line
-// ends; SECONDS is the offset within the day; tools/stat/import_number.h has the form of doubles.
+// A day is a number of days since 1970-01-01, YYYY-MM-DD, "today" or "yesterday"; a key is UTF-8
+// without tabs and line ends, and not empty; SECONDS is the offset within the day, below 86400;
+// doubles are those of tools/stat/import_number.h.
 #pragma once
 
 #include <cstdint>
@@ -28,12 +29,15 @@ struct ImportLine {
 };
 
 /// Reads one line without its end. The error says what is wrong.
-Expected<ImportLine> parseImportLine(std::string_view line);
+Expected<ImportLine> parseImportLine(std::string_view line, std::int32_t today);
 
 /// Cuts a stream into lines and reads each.
 class ImportParser {
  public:
   using Sink = std::function<Status(const ImportLine& line)>;
+
+  /// `today`: the number of the day that "today" means.
+  explicit ImportParser(std::int32_t today) : today_(today) {}
 
   /// Takes the next bytes. Stops at the first line that is bad or that the sink refuses.
   Status feed(std::string_view bytes, const Sink& sink);
@@ -46,6 +50,7 @@ class ImportParser {
  private:
   Status takeLine(std::string_view line, const Sink& sink);
 
+  const std::int32_t today_;
   std::string begun_;  // of a line whose end has not come yet
   std::uint64_t lines_ = 0;
 };

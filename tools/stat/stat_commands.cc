@@ -19,6 +19,8 @@
 #include "tools/stat/collect.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/import_number.h"
+#include "tools/stat/stat_list.h"
+#include "tools/stat/stat_show.h"
 #include "tools/stat/stat_transfer.h"
 
 namespace tavrel {
@@ -31,6 +33,7 @@ struct Arguments {
   std::vector<std::string> values;
   std::string day;
   std::uint32_t seconds = 5;
+  std::optional<std::uint32_t> days;
 };
 
 // The offset of this instant within its day.
@@ -53,7 +56,7 @@ void change(ToolContext& context, Change change) {
 bool checkKey(ToolContext& context, const std::string& key) {
   if (isExportable(key)) return true;
   context.failUsage(format("not a key: %s: give UTF-8 text without tabs and line ends",
-                           std::string_view(key).substr(0, 60)));
+                           key.empty() ? "\"\"" : std::string_view(key).substr(0, 60)));
   return false;
 }
 
@@ -104,60 +107,21 @@ bool parseDayOption(ToolContext& context, const std::string& text,
   return true;
 }
 
-void list(ToolContext& context, const Arguments& arguments) {
-  std::optional<std::int32_t> day;
-  if (!parseDayOption(context, arguments.day, day)) return;
-  const auto history = context.storeForReading().openHistory();
-  if (!history) return context.fail(history.error().message);
-  const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
-  const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
-
-  Table table({{"DAY"}, {"KIND"}, {"KEY"}, {"VALUE", Table::Align::Right}});
-  Json scalars = Json::array();
-  Json distributions = Json::array();
-  const bool json = context.json();
-  const auto rowOf = [](std::string_view key, std::int32_t rowDay) {
-    return Json{{"key", key}, {"day", rowDay}, {"date", dayDateText(rowDay)}};
-  };
-  Status walked = (*history)->walkScalars(
-      arguments.key, first, last,
-      [&](std::string_view key, std::int32_t rowDay, std::int64_t value, bool&) {
-        if (json) {
-          scalars.push_back(rowOf(key, rowDay));
-          scalars.back()["value"] = value;
-        } else {
-          table.add({dayText(rowDay), "scalar", std::string(key), std::to_string(value)});
-        }
-      });
-  if (walked) {
-    walked = (*history)->walkDistributions(
-        arguments.key, first, last,
-        [&](std::string_view key, std::int32_t rowDay, std::int64_t count,
-            BHHistoryDistributionEnumerator&, bool&) {
-          if (json) {
-            distributions.push_back(rowOf(key, rowDay));
-            distributions.back()["count"] = count;
-          } else {
-            table.add({dayText(rowDay), "distribution", std::string(key),
-                       counted(static_cast<std::uint64_t>(count), "value")});
-          }
-        });
-  }
-  if (!walked) return context.fail(walked.error().message);
-  if (json) {
-    context.printJson(
-        {{"scalars", std::move(scalars)}, {"distributions", std::move(distributions)}});
-  } else if (!table.empty()) {
-    table.print(context.out(), context.columns());
-  }
-}
-
 Command addCommand(Command group, const char* name, const char* description,
                    const std::shared_ptr<Arguments>& arguments, ToolContext& context,
                    void (*action)(ToolContext&, const Arguments&)) {
   const Command command = group.addCommand(name, description);
   command.onRun([&context, arguments, action] { action(context, *arguments); });
   return command;
+}
+
+// What is wrong with the text of --days; nothing when it is good.
+std::string daysFault(const std::string& text) {
+  std::uint32_t days = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), days);
+  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
+  if (isNumber && days > 0) return {};
+  return format("not a number of days: %s: give 1 or more", text);
 }
 
 void addKey(Command command, Arguments& arguments) {
@@ -185,6 +149,10 @@ void addStatCommands(Command app, ToolContext& context) {
       [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
   import.addOption("FILE", arguments->file,
                    "Kept as a whole or not at all; - is standard input (default)");
+  import.setFooter(
+      "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar replaces\n"
+      "that of its day. Values are added to those of their day: importing a file twice doubles\n"
+      "them.");
   context.addJsonOption(import);
 
   const Command exported =
@@ -215,10 +183,25 @@ void addStatCommands(Command app, ToolContext& context) {
                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
       .required();
 
-  const Command listed =
-      addCommand(group, "list", "List what is held, by day", arguments, context, list);
+  const Command listed = addCommand(group, "list", "List what is held, by day", arguments, context,
+                                    [](ToolContext& tool, const Arguments& given) {
+                                      std::optional<std::int32_t> day;
+                                      if (parseDayOption(tool, given.day, day))
+                                        listStatistics(tool, given.key, day);
+                                    });
   addSelection(listed, *arguments);
   context.addJsonOption(listed);
+
+  const Command shown =
+      addCommand(group, "show", "Show one statistic: its values by day, and what they come to",
+                 arguments, context, [](ToolContext& tool, const Arguments& given) {
+                   showStatistic(tool, given.key, given.days);
+                 });
+  addKey(shown, *arguments);
+  shown.addOption("--days", arguments->days, "Only the last N days, today included (default: all)")
+      .typeName("N")
+      .check(daysFault);
+  context.addJsonOption(shown);
 
   const Command collected = addCommand(
       group, "collect", "Sample this machine once a second into today's statistics", arguments,

@@ -13,8 +13,10 @@
 #include "base/format.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
 #include "tools/shared/table.h"
 #include "tools/stat/import_lines.h"
+#include "tools/stat/line_writer.h"
 #include "tools/stat/stat_progress.h"
 
 namespace tavrel {
@@ -27,8 +29,9 @@ struct Counts {
   std::uint64_t values = 0;
 };
 
-Status feedAll(std::istream& in, const std::string& name, const ImportParser::Sink& sink) {
-  ImportParser parser;
+Status feedAll(std::istream& in, const std::string& name, std::int32_t today,
+               const ImportParser::Sink& sink) {
+  ImportParser parser(today);
   std::vector<char> block(kBlockBytes);
   Status fed = Done{};
   while (in && fed) {
@@ -55,7 +58,8 @@ void importStream(ToolContext& context, std::istream& in, const std::string& nam
     ++counts.values;
     return (*batch)->appendValue(line.day, line.key, line.seconds, line.value);
   };
-  if (const Status fed = feedAll(in, name, sink); !fed) {
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
+  if (const Status fed = feedAll(in, name, today, sink); !fed) {
     return context.fail(fed.error().message + "; nothing of the file was kept");
   }
   if (const Status kept = (*batch)->commit(); !kept) {
@@ -68,29 +72,6 @@ void importStream(ToolContext& context, std::istream& in, const std::string& nam
                   << counted(counts.values, "value") << '\n';
   }
 }
-
-// Collects lines and passes them on in large pieces.
-class LineWriter {
- public:
-  explicit LineWriter(std::ostream& out) : out_(out) {}
-  ~LineWriter() { flush(); }
-  LineWriter(const LineWriter&) = delete;
-  LineWriter& operator=(const LineWriter&) = delete;
-
-  std::string& buffer() { return buffer_; }
-  /// False when the stream takes no more.
-  bool flushIfLarge() { return buffer_.size() < kBlockBytes / 16 || flush(); }
-
- private:
-  bool flush() {
-    out_.write(buffer_.data(), static_cast<std::streamsize>(buffer_.size()));
-    buffer_.clear();
-    return out_.good();
-  }
-
-  std::ostream& out_;
-  std::string buffer_;
-};
 
 }  // namespace
 
@@ -114,10 +95,10 @@ void exportStatistics(ToolContext& context, const std::string& prefix,
   const auto canBeWritten = [&](std::string_view key) {
     progress.count("exported", ++rows);
     if (isExportable(key)) return true;
-    context.fail(
-        format("not exported: the key %s holds a tab, a line end or bytes that are no "
-               "UTF-8: read the store with sqlite3",
-               printable(key.substr(0, 60))));
+    context.fail(format(
+        "not exported: the key \"%s\" is empty or holds a tab, a line end or bytes that are no "
+        "UTF-8: read the store with sqlite3",
+        printable(key.substr(0, 60))));
     return false;
   };
   Status walked = (*history)->walkScalars(

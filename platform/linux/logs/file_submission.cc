@@ -4,8 +4,7 @@
 #include <utility>
 
 #include "base/limits.h"
-#include "platform/linux/files/random.h"
-#include "platform/linux/files/stamp.h"
+#include "platform/linux/logs/log_file_name.h"
 
 namespace tavrel {
 namespace {
@@ -16,22 +15,9 @@ constexpr std::string_view kMetadataEnding = ".metadata.plist";
 constexpr std::string_view kServiceDomain = "com.norvane.zentrix";
 constexpr std::string_view kTaskingDomain = "com.norvane.da";
 constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
-constexpr std::size_t kLongestNamePart = 64;
 
 // Statistics are readable by their owner and a group of operators only.
 constexpr mode_t kMode = 0640;
-
-/// The log's name as the beginning of a file's name.
-std::string safeNamePart(std::string_view logName) {
-  std::string part(logName.substr(0, kLongestNamePart));
-  for (char& c : part) {
-    const bool isPlain = (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') ||
-                         (c >= '0' && c <= '9') || c == '-' || c == '_' || c == '.';
-    if (!isPlain) c = '_';
-  }
-  if (part.empty() || part[0] == '.') part.insert(0, "_");
-  return part;
-}
 
 /// `file` without `ending`; empty when it has another.
 std::string withoutEnding(const std::string& file, std::string_view ending) {
@@ -93,7 +79,7 @@ bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::str
                                               const LogWriter& writer) {
   const Status filed = fileLog(logType, logName, options, writer);
   if (!filed) {
-    log_.log(LogLevel::Error, "log \"%s\" is not filed: %s", safeNamePart(logName),
+    log_.log(LogLevel::Error, "log \"%s\" is not filed: %s", plainLogName(logName),
              filed.error().message);
   }
   return static_cast<bool>(filed);
@@ -110,8 +96,7 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
   const auto metadataBytes = propertyLists_.encodeXml(metadata);
   if (!metadataBytes) return metadataBytes.error();
 
-  const std::string name =
-      safeNamePart(logName) + "-" + compactStamp(now) + "-" + randomName().substr(0, 8);
+  const std::string name = newLogFileName(logName, now);
   const std::string logPath = join(folder(Place::Pending), name, kLogEnding);
   const std::string metadataPath = join(folder(Place::Pending), name, kMetadataEnding);
 
@@ -190,27 +175,36 @@ Status FileSubmission::moveToOutbox(const std::string& name) {
                        join(outbox, name, kLogEnding));
 }
 
-Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::logs(Place place) {
+Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::files(Place place) {
   const auto files = files_.list(folder(place));
   if (!files) return files.error();
   std::vector<FiledLog> logs;
   for (const std::string& file : *files) {
     std::string name = withoutEnding(file, kLogEnding);
     if (name.empty()) continue;
-    FiledLog log{place, name, join(folder(place), file, {}), {}};
-    if (const auto bytes = files_.readIfPresent(join(folder(place), name, kMetadataEnding),
-                                                limits::kPropertyListBytes);
-        bytes && *bytes) {
-      if (const auto value = propertyLists_.decode(asBytes(**bytes))) {
-        log.metadata = value->dictionary();
-      }
-    }
-    logs.push_back(std::move(log));
+    logs.push_back({place, std::move(name), join(folder(place), file, {}), {}});
   }
+  return logs;
+}
+
+void FileSubmission::readMetadata(FiledLog& log) {
+  const auto bytes = files_.readIfPresent(join(folder(log.place), log.name, kMetadataEnding),
+                                          limits::kPropertyListBytes);
+  if (!bytes || !*bytes) return;
+  if (const auto value = propertyLists_.decode(asBytes(**bytes))) {
+    log.metadata = value->dictionary();
+  }
+}
+
+Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::logs(Place place) {
+  auto logs = files(place);
+  if (!logs) return logs;
+  for (FiledLog& log : *logs)
+    readMetadata(log);
   const auto time = [](const FiledLog& log) {
     return log.metadata.date(kLogMetadataTime).value_or(plist::Date::ofDay(0)).secondsSinceEpoch();
   };
-  std::stable_sort(logs.begin(), logs.end(),
+  std::stable_sort(logs->begin(), logs->end(),
                    [&](const FiledLog& a, const FiledLog& b) { return time(a) < time(b); });
   return logs;
 }

@@ -56,7 +56,12 @@ class FileSubmission final : public SubmissionService {
   plist::Value ZTXGetDATaskingValue(std::string_view key) override;
   void submitDiagnosticLogs() override;
 
-  /// The logs of one place, oldest first.
+  /// The logs of one place in the order of their names, which `parseLogFileName` reads; no file is
+  /// opened and `metadata` is empty.
+  Expected<std::vector<FiledLog>> files(Place place);
+  void readMetadata(FiledLog& log);
+
+  /// The logs of one place with their metadata, oldest first. Opens the metadata of each.
   Expected<std::vector<FiledLog>> logs(Place place);
 
  private:

@@ -92,6 +92,27 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
   std::optional<StoreFailure> failure_;
 };
 
+// Runs `next`, one of store_sql::kNext..., through the days that hold `key`, and calls `handle`
+// while a row of it stands there.
+template <class Handle>
+void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDay,
+               std::int32_t lastDay, Handle handle) {
+  bool stop = false;
+  for (std::int64_t day = firstDay; !stop && day <= lastDay;) {
+    next.bind(1, day);
+    next.bind(2, key);
+    next.bind(3, lastDay);
+    if (!next.step()) break;
+    const std::string_view found = next.bytes(0);
+    day = next.integer(1);
+    if (found == key) handle(stop);
+    // A lower key comes first in a later day, which may still have this one.
+    if (found >= key) ++day;
+    next.reset();
+  }
+  next.reset();
+}
+
 }  // namespace
 
 struct SqliteHistory::Selection {
@@ -141,7 +162,9 @@ void SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t mi
                                         std::int64_t maxDaysSince1970,
                                         const ScalarRowHandler& rowHandler) {
   try {
-    readScalars(Selection::between(prefix, minDaysSince1970, maxDaysSince1970), rowHandler);
+    readUnchanged([&] {
+      readScalars(Selection::between(prefix, minDaysSince1970, maxDaysSince1970), rowHandler);
+    });
   } catch (const StoreFailure& failure) {
     report(failure);
   }
@@ -152,40 +175,57 @@ void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                                               std::int64_t maxDaysSince1970,
                                               const DistributionRowHandler& rowHandler) {
   try {
-    readDistributions(
-        Selection::between(prefix, minDaysSince1970, maxDaysSince1970),
-        [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
-                      BHHistoryDistributionEnumerator& values,
-                      bool& stop) { rowHandler(key, day, values, stop); },
-        [this](const StoreFailure& failure) { site_.tell(failure); });
+    readUnchanged([&] {
+      readDistributions(
+          Selection::between(prefix, minDaysSince1970, maxDaysSince1970),
+          [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
+                        BHHistoryDistributionEnumerator& values,
+                        bool& stop) { rowHandler(key, day, values, stop); },
+          [this](const StoreFailure& failure) { site_.tell(failure); });
+    });
   } catch (const StoreFailure& failure) {
     report(failure);
   }
 }
 
-Status SqliteHistory::walkScalars(std::string_view prefix, std::int32_t firstDay,
-                                  std::int32_t lastDay, const ScalarRowHandler& rowHandler) {
+// What is read without locks is good only when nobody has written meanwhile.
+void SqliteHistory::checkUnchanged() const {
+  if (!store_->lockless || FileVersion::of(site_.path) == store_->lockless) return;
+  throw StoreFailure{StoreFault::Busy, "was written while it was read: run the command again"};
+}
+
+template <class Read>
+void SqliteHistory::readUnchanged(Read read) {
+  if (!store_) return;
   try {
-    readScalars({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler);
+    read();
+  } catch (const StoreFailure&) {
+    checkUnchanged();
+    throw;
+  }
+  checkUnchanged();
+}
+
+template <class Read>
+Status SqliteHistory::attempt(Read read) {
+  try {
+    readUnchanged(read);
   } catch (const StoreFailure& failure) {
     return Error{site_.describe(failure)};
   }
   return Done{};
 }
 
-Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t firstDay,
-                                        std::int32_t lastDay, const CountedRowHandler& rowHandler) {
+// `read` is given a handler for failures that concern one distribution.
+template <class Read>
+Status SqliteHistory::attemptTellingAtEnd(Read read) {
   std::optional<StoreFailure> first;
   std::int64_t others = 0;
-  try {
-    readDistributions({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler,
-                      [&](const StoreFailure& failure) {
-                        if (first) return void(++others);
-                        first = failure;
-                      });
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
+  const FailureHandler tell = [&](const StoreFailure& failure) {
+    if (first) return void(++others);
+    first = failure;
+  };
+  if (Status done = attempt([&] { read(tell); }); !done) return done;
   if (!first) return Done{};
   std::string message = site_.describe(*first);
   if (others > 0) {
@@ -194,37 +234,64 @@ Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t fi
   return Error{std::move(message)};
 }
 
-Expected<SqliteHistory::Holdings> SqliteHistory::holdings() {
-  Holdings holdings;
-  if (!store_) return holdings;
-  try {
-    // One look-up for each day in the store, instead of a walk over all rows.
-    SqliteStatement scalars(store_->connection, "SELECT min(day) FROM scalars WHERE day >= ?1");
-    SqliteStatement distributions(store_->connection,
-                                  "SELECT min(day) FROM distributions WHERE day >= ?1");
-    constexpr std::int64_t kNone = std::numeric_limits<std::int64_t>::max();
-    const auto firstFrom = [](SqliteStatement& statement, std::int64_t day) {
-      statement.bind(1, day);
-      const std::int64_t found =
-          statement.step() && !statement.isNull(0) ? statement.integer(0) : kNone;
-      statement.reset();
-      return found;
-    };
-    std::int64_t day = std::numeric_limits<std::int32_t>::min();
-    while (true) {
-      day = std::min(firstFrom(scalars, day), firstFrom(distributions, day));
-      if (day > std::numeric_limits<std::int32_t>::max()) break;
-      if (holdings.days++ == 0) holdings.firstDay = static_cast<std::int32_t>(day);
-      holdings.lastDay = static_cast<std::int32_t>(day++);
+Status SqliteHistory::walkScalars(std::string_view prefix, std::int32_t firstDay,
+                                  std::int32_t lastDay, const ScalarRowHandler& rowHandler) {
+  return attempt([&] { readScalars({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler); });
+}
+
+Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t firstDay,
+                                        std::int32_t lastDay, const CountedRowHandler& rowHandler) {
+  return attemptTellingAtEnd([&](const FailureHandler& tell) {
+    readDistributions({prefix, firstDay, lastDay, Order::DayThenKey}, rowHandler, tell);
+  });
+}
+
+Status SqliteHistory::walkScalar(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
+                                 const ScalarRowHandler& rowHandler) {
+  return attempt([&] {
+    SqliteStatement next(store_->connection, store_sql::kNextScalar);
+    eachDayOf(next, key, firstDay, lastDay, [&](bool& stop) {
+      rowHandler(key, static_cast<std::int32_t>(next.integer(1)), next.integer(2), stop);
+    });
+  });
+}
+
+Status SqliteHistory::walkDistribution(std::string_view key, std::int32_t firstDay,
+                                       std::int32_t lastDay, const CountedRowHandler& rowHandler) {
+  return attemptTellingAtEnd([&](const FailureHandler& tell) {
+    SqliteStatement next(store_->connection, store_sql::kNextDistribution);
+    SqliteStatement chunks(store_->connection, store_sql::kChunks);
+    eachDayOf(next, key, firstDay, lastDay,
+              [&](bool& stop) { readRow(next, chunks, rowHandler, tell, stop); });
+  });
+}
+
+Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
+  std::optional<DaySpan> span;
+  const Status read = attempt([&] {
+    // Of each table one look-up at either end.
+    for (const char* table : {"scalars", "distributions"}) {
+      for (const char* end : {"min", "max"}) {
+        SqliteStatement statement(store_->connection,
+                                  std::string("SELECT ") + end + "(day) FROM " + table);
+        if (!statement.step() || statement.isNull(0)) break;
+        const auto day = static_cast<std::int32_t>(statement.integer(0));
+        if (!span) span = DaySpan{day, day};
+        span->first = std::min(span->first, day);
+        span->last = std::max(span->last, day);
+      }
     }
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
-  return holdings;
+  });
+  if (!read) return read.error();
+  return span;
+}
+
+Status SqliteHistory::beginSnapshot() {
+  return attempt([&] { store_->connection.execute("BEGIN"); });
 }
 
 void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandler& rowHandler) {
-  if (!store_ || selection.isEmpty()) return;
+  if (selection.isEmpty()) return;
   SqliteStatement rows(store_->connection,
                        selection.choose(store_sql::kScalarsOfDay, store_sql::kScalarsByKey,
                                         store_sql::kScalarsByDay));
@@ -242,7 +309,7 @@ void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandl
 void SqliteHistory::readDistributions(const Selection& selection,
                                       const CountedRowHandler& rowHandler,
                                       const FailureHandler& tell) {
-  if (!store_ || selection.isEmpty()) return;
+  if (selection.isEmpty()) return;
   SqliteStatement rows(store_->connection, selection.choose(store_sql::kDistributionsOfDay,
                                                             store_sql::kDistributionsByKey,
                                                             store_sql::kDistributionsByDay));
@@ -250,21 +317,27 @@ void SqliteHistory::readDistributions(const Selection& selection,
   selection.bind(rows);
   bool stop = false;
   while (!stop && rows.step()) {
-    const std::string_view key = rows.bytes(0);
-    if (!key.starts_with(selection.prefix)) break;
-    const auto day = static_cast<std::int32_t>(rows.integer(1));
-    const std::int64_t count = rows.integer(3);
-    ChunkEnumerator values(chunks, rows.integer(2), count);
-    rowHandler(key, day, count, values, stop);
-    if (!values.failure()) continue;
-    if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();
-    tell(inDistribution(key, day, *values.failure()));
+    if (!rows.bytes(0).starts_with(selection.prefix)) break;
+    readRow(rows, chunks, rowHandler, tell, stop);
   }
+}
+
+void SqliteHistory::readRow(SqliteStatement& row, SqliteStatement& chunks,
+                            const CountedRowHandler& rowHandler, const FailureHandler& tell,
+                            bool& stop) {
+  const std::string_view key = row.bytes(0);
+  const auto day = static_cast<std::int32_t>(row.integer(1));
+  const std::int64_t count = row.integer(3);
+  ChunkEnumerator values(chunks, row.integer(2), count);
+  rowHandler(key, day, count, values, stop);
+  if (!values.failure()) return;
+  if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();
+  tell(inDistribution(key, day, *values.failure()));
 }
 
 void SqliteHistory::report(const StoreFailure& failure) {
   std::optional<StoreFailure> untold = failure;
-  if (failure.fault == StoreFault::Damaged && !store_->immutable) {
+  if (failure.fault == StoreFault::Damaged && !store_->lockless) {
     store_.reset();
     untold = site_.setAside(identity_, failure);
   }

@@ -49,14 +49,21 @@ class SqliteHistory : public BHHistory {
   Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                            const CountedRowHandler& rowHandler);
 
-  struct Holdings {
-    std::int64_t days = 0;
-    /// Meaningless when there are no days.
-    std::int32_t firstDay = 0;
-    std::int32_t lastDay = 0;
+  /// The rows of one key by day, in the same way. Costs one look-up for each day held.
+  Status walkScalar(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
+                    const ScalarRowHandler& rowHandler);
+  Status walkDistribution(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
+                          const CountedRowHandler& rowHandler);
+
+  struct DaySpan {
+    std::int32_t first = 0;
+    std::int32_t last = 0;
   };
-  /// The days that have any rows.
-  Expected<Holdings> holdings();
+  /// From the first to the last day of which anything is held; nothing when the store is empty.
+  Expected<std::optional<DaySpan>> daysHeld();
+
+  /// From here on all queries see the store as it is at the first of them.
+  Status beginSnapshot();
 
  private:
   enum class Order : std::uint8_t { KeyThenDay, DayThenKey };
@@ -66,6 +73,15 @@ class SqliteHistory : public BHHistory {
   using FailureHandler = std::function<void(const StoreFailure& failure)>;
   void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
                          const FailureHandler& tell);
+  static void readRow(SqliteStatement& row, SqliteStatement& chunks,
+                      const CountedRowHandler& rowHandler, const FailureHandler& tell, bool& stop);
+  template <class Read>
+  void readUnchanged(Read read);
+  void checkUnchanged() const;
+  template <class Read>
+  Status attempt(Read read);
+  template <class Read>
+  Status attemptTellingAtEnd(Read read);
   void report(const StoreFailure& failure);
 
   StoreSite site_;

@@ -76,9 +76,13 @@ bool checkIsFile(const std::string& path) {
   return true;
 }
 
+// A journal is left where another program has put the store in SQLite's older mode.
 bool hasLog(const std::string& path) {
   struct stat status;
-  return stat((path + "-wal").c_str(), &status) == 0 && status.st_size != 0;
+  for (const char* suffix : {"-wal", "-journal"}) {
+    if (stat((path + suffix).c_str(), &status) == 0 && status.st_size != 0) return true;
+  }
+  return false;
 }
 
 // True when the store has tables to read.
@@ -122,12 +126,22 @@ SqliteConnection openStoreForWriting(const std::string& path,
 }
 
 std::optional<ReadableStore> openStoreForReading(const std::string& path,
-                                                 const std::shared_ptr<BusyBudget>& busy) {
+                                                 const std::shared_ptr<BusyBudget>& busy,
+                                                 bool leavesNoTrace) {
   if (!checkIsFile(path)) return std::nullopt;
+  // Taken before the log is looked at: what a writer moves from its log into the file from here on
+  // changes the version.
+  const auto version = FileVersion::of(path);
+  const auto openLockless = [&]() -> std::optional<ReadableStore> {
+    SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
+    if (!isReadable(connection)) return std::nullopt;
+    return ReadableStore{std::move(connection), version};
+  };
+  if (leavesNoTrace && version && !hasLog(path)) return openLockless();
   try {
     SqliteConnection connection(path, SqliteConnection::Access::Read, busy);
     if (!isReadable(connection)) return std::nullopt;
-    return ReadableStore{std::move(connection), false};
+    return ReadableStore{std::move(connection), std::nullopt};
   } catch (const StoreFailure& failure) {
     // Using the log takes files in the store's folder, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
@@ -139,10 +153,8 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
                              "written: have a user who may write run 'tavrelctl stat list' once"};
     }
   }
-  // Without a log no process is writing, and the file itself is complete.
-  SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
-  if (!isReadable(connection)) return std::nullopt;
-  return ReadableStore{std::move(connection), true};
+  // Without a log all there is stands in the file itself.
+  return openLockless();
 }
 
 }  // namespace tavrel

@@ -9,6 +9,7 @@
 #include <string_view>
 
 #include "platform/linux/store/sqlite_connection.h"
+#include "platform/linux/store/sqlite_site.h"
 
 namespace tavrel {
 
@@ -36,7 +37,15 @@ inline constexpr std::string_view kDistributionsByDay =
     "SELECT key, day, series, count FROM distributions WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
     "AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
 
-/// ?1 first chunk, ?2 chunk after the last.
+/// ?1 day, ?2 key, ?3 last day. The first row that is not before that key of that day.
+inline constexpr std::string_view kNextScalar =
+    "SELECT key, day, value FROM scalars WHERE (day, key) >= (?1, ?2) AND day <= ?3 "
+    "ORDER BY day, key LIMIT 1";
+inline constexpr std::string_view kNextDistribution =
+    "SELECT key, day, series, count FROM distributions WHERE (day, key) >= (?1, ?2) AND day <= ?3 "
+    "ORDER BY day, key LIMIT 1";
+
+/// ?1 first chunk, ?2 chunk behind the last.
 inline constexpr std::string_view kChunks =
     "SELECT data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
 
@@ -56,12 +65,15 @@ SqliteConnection openStoreForWriting(const std::string& path,
 
 struct ReadableStore {
   SqliteConnection connection;
-  /// Opened without locks because the log could not be used.
-  bool immutable;
+  /// Set when the file is read without locks and without a log: the file as it was before. What was
+  /// read is good as long as this has not changed.
+  std::optional<FileVersion> lockless;
 };
 
-/// Opens the store for reading; nothing when there is none yet.
+/// Opens the store for reading; nothing when there is none yet. `leavesNoTrace`: where the log
+/// holds nothing, the file is read without locks, so that no log files are made beside it.
 std::optional<ReadableStore> openStoreForReading(const std::string& path,
-                                                 const std::shared_ptr<BusyBudget>& busy);
+                                                 const std::shared_ptr<BusyBudget>& busy,
+                                                 bool leavesNoTrace = false);
 
 }  // namespace tavrel

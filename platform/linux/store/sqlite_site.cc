@@ -50,6 +50,15 @@ void withholdFromOthers(const std::string& path) {
   }
 }
 
+std::optional<FileVersion> FileVersion::of(const std::string& path) {
+  struct stat status;
+  if (lstat(path.c_str(), &status) != 0) return std::nullopt;
+  return FileVersion{{status.st_dev, status.st_ino},
+                     status.st_size,
+                     status.st_mtim.tv_sec,
+                     status.st_mtim.tv_nsec};
+}
+
 StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy) {
   const std::string folder = folderOf(storePath);
   descriptor_ = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
@@ -85,7 +94,7 @@ void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) 
 
 std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
                                                 const StoreFailure& failure) const {
-  if (leavesDamaged) {
+  if (changesNothing) {
     return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
   }
   try {

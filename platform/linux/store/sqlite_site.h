@@ -30,6 +30,17 @@ struct FileIdentity {
 /// there and belong to this user.
 void withholdFromOthers(const std::string& path);
 
+/// Which file stands at a path, and as of when.
+struct FileVersion {
+  FileIdentity identity;
+  std::int64_t bytes = 0;
+  std::int64_t seconds = 0;  // of its last change, and nanoseconds
+  std::int64_t nanoseconds = 0;
+  bool operator==(const FileVersion&) const = default;
+
+  static std::optional<FileVersion> of(const std::string& path);
+};
+
 /// Held while the store's file is created or set aside, so that of several processes one does it.
 /// The lock is on the store's folder and goes with the process.
 class StoreFolderLock {
@@ -51,9 +62,10 @@ struct StoreSite {
   Clock& clock;
   Preferences& preferences;
   SystemLog& log;
-  /// A damaged store stays where it is: for readers that change nothing.
-  bool leavesDamaged = false;
-  /// Failures that last until somebody intervenes; they are reported once.
+  /// For readers that change nothing: a damaged store stays where it is, and reading makes no log
+  /// files beside the store.
+  bool changesNothing = false;
+  /// Failures that only somebody's intervention ends: they are told once.
   std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
 
   /// "statistics store PATH: MESSAGE".

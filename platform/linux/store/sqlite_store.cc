@@ -15,13 +15,13 @@
 namespace tavrel {
 
 SqliteStore::SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences,
-                         SystemLog& log, int busyMilliseconds, bool leavesDamaged)
+                         SystemLog& log, int busyMilliseconds, bool changesNothing)
     : site_{root.path(kStorePath),
             std::make_shared<BusyBudget>(busyMilliseconds),
             clock,
             preferences,
             log,
-            leavesDamaged} {}
+            changesNothing} {}
 
 SqliteStore::~SqliteStore() {
   if (pending_.empty()) return;
@@ -99,19 +99,20 @@ bool SqliteStore::keep(const StoreFailure& failure) {
   values.reserve(pending_.size());
   for (const auto& [name, value] : pending_)
     values.push_back({0, name.first, value, name.second});
-  const std::string count = "; " + std::to_string(values.size()) + " values ";
+  const bool isOne = values.size() == 1;
+  const std::string count = "; " + std::to_string(values.size()) + (isOne ? " value " : " values ");
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
     const auto dropped = KeptValues(site_.path).add(std::move(values));
     if (!dropped) throw StoreFailure{StoreFault::Device, dropped.error().message};
-    site_.tell(failure, count + "wait for the next commit");
+    site_.tell(failure, count + (isOne ? "waits" : "wait") + " for the next commit");
     if (*dropped > 0) {
       site_.log.log(LogLevel::Error, "%s-kept is full: the %llu earliest values are dropped",
                     site_.path, std::uint64_t{*dropped});
     }
     return true;
   } catch (const StoreFailure& obstacle) {
-    site_.tell(failure, count + "are not kept yet: " + obstacle.message);
+    site_.tell(failure, count + (isOne ? "is" : "are") + " not kept yet: " + obstacle.message);
     return false;
   }
 }
@@ -141,8 +142,8 @@ void SqliteStore::checkpoint() {
 
 std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
     const std::optional<FileIdentity>& identity) {
-  return std::make_unique<SqliteHistory>(site_, identity,
-                                         openStoreForReading(site_.path, site_.busy));
+  return std::make_unique<SqliteHistory>(
+      site_, identity, openStoreForReading(site_.path, site_.busy, site_.changesNothing));
 }
 
 std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {

@@ -38,10 +38,10 @@ inline constexpr std::string_view kStorePath = "/var/mobile/Library/Brimhold/BHD
 
 class SqliteStore : public StatisticsStore {
  public:
-  /// The services must outlive the store. `busyMilliseconds`: how long to wait for a locked store,
-  /// all operations together. `leavesDamaged`: report a damaged store but do not set it aside.
+  /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited
+  /// for, in all operations together. `changesNothing`: the store is only read; see `StoreSite`.
   SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences, SystemLog& log,
-              int busyMilliseconds = limits::kStoreBusyMilliseconds, bool leavesDamaged = false);
+              int busyMilliseconds = limits::kStoreBusyMilliseconds, bool changesNothing = false);
   ~SqliteStore() override;
 
   std::int32_t BHDaysSince1970() override;

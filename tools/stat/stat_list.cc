@@ -1,0 +1,293 @@
+#include "tools/stat/stat_list.h"
+
+#include <algorithm>
+#include <charconv>
+#include <limits>
+#include <nlohmann/json.hpp>
+#include <string_view>
+#include <vector>
+
+#include "base/utf8.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+#include "tools/stat/line_writer.h"
+
+namespace tavrel {
+namespace {
+
+// Rows held back for the widths of their columns. A longer list has widths that fit every row.
+constexpr std::size_t kRowsMeasured = 1024;
+constexpr std::size_t kBytesMeasured = 256U << 10;
+
+constexpr std::string_view kNumbers = "-9223372036854775808";
+constexpr std::string_view kDistribution = "distribution";
+
+struct Selection {
+  std::string prefix;
+  std::int32_t first;
+  std::int32_t last;
+};
+
+bool isPlain(std::string_view text) {
+  return std::all_of(text.begin(), text.end(),
+                     [](char c) { return c >= ' ' && c <= '~' && c != '"' && c != '\\'; });
+}
+
+// One statistic of one day: the value of a scalar, or how many values a distribution has.
+struct Row {
+  bool isScalar;
+  std::int32_t day;
+  std::int64_t number;
+  std::string_view key;
+};
+
+// The date of a day; the rows of one day follow each other.
+class DayTexts {
+ public:
+  const std::string& date(std::int32_t day) {
+    if (date_.empty() || day != day_) {
+      day_ = day;
+      date_ = dayDateText(day);
+      text_ = dayText(day);
+    }
+    return date_;
+  }
+  const std::string& text(std::int32_t day) {
+    date(day);
+    return text_;
+  }
+
+ private:
+  std::int32_t day_ = 0;
+  std::string date_;
+  std::string text_;
+};
+
+void appendNumber(std::string& out, std::int64_t number) {
+  char digits[24];
+  const auto [end, error] = std::to_chars(digits, digits + sizeof digits, number);
+  out.append(digits, end);
+}
+
+// The table. The key stands last, so that a long one shifts nothing.
+class TableWriter {
+ public:
+  TableWriter(LineWriter& lines, std::optional<std::size_t> columns, std::size_t widestDay)
+      : lines_(lines), columns_(columns), widestDay_(widestDay) {}
+
+  void add(const Row& row) {
+    if (isMeasured_) return write(row);
+    if (keys_.size() + row.key.size() > kBytesMeasured || rows_.size() == kRowsMeasured) {
+      widths_ = {widestDay_, kDistribution.size(), kNumbers.size()};
+      writeMeasured();
+      return write(row);
+    }
+    keys_ += row.key;
+    rows_.push_back(row);
+    rows_.back().key = std::string_view(nullptr, 0);
+    keySizes_.push_back(row.key.size());
+    measure(row);
+  }
+
+  /// False when there was no row.
+  bool finish() {
+    if (!isMeasured_ && !rows_.empty()) writeMeasured();
+    return isMeasured_;
+  }
+
+ private:
+  struct Widths {
+    std::size_t day = std::string_view("DAY").size();
+    std::size_t kind = std::string_view("KIND").size();
+    std::size_t value = std::string_view("VALUE").size();
+  };
+
+  static std::string_view kindOf(const Row& row) {
+    return row.isScalar ? std::string_view("scalar") : kDistribution;
+  }
+
+  // The text of the value column.
+  static void appendValue(std::string& out, const Row& row) {
+    appendNumber(out, row.number);
+    if (!row.isScalar) out += row.number == 1 ? " value" : " values";
+  }
+
+  void measure(const Row& row) {
+    std::string value;
+    appendValue(value, row);
+    widths_.day = std::max(widths_.day, days_.text(row.day).size());
+    widths_.kind = std::max(widths_.kind, kindOf(row).size());
+    widths_.value = std::max(widths_.value, value.size());
+  }
+
+  void writeMeasured() {
+    isMeasured_ = true;
+    writeLine("DAY", "KIND", "VALUE", "KEY");
+    std::size_t start = 0;
+    for (std::size_t i = 0; i < rows_.size(); ++i) {
+      Row row = rows_[i];
+      row.key = std::string_view(keys_).substr(start, keySizes_[i]);
+      start += keySizes_[i];
+      write(row);
+    }
+    rows_ = {};
+    keys_ = {};
+    keySizes_ = {};
+  }
+
+  void write(const Row& row) {
+    value_.clear();
+    appendValue(value_, row);
+    writeLine(days_.text(row.day), kindOf(row), value_, row.key);
+  }
+
+  void writeLine(std::string_view day, std::string_view kind, std::string_view value,
+                 std::string_view key) {
+    std::string& out = lines_.buffer();
+    const auto pad = [&](std::size_t width, std::string_view text) {
+      if (width > text.size()) out.append(width - text.size(), ' ');
+    };
+    out += day;
+    pad(widths_.day + 2, day);
+    out += kind;
+    pad(widths_.kind + 2, kind);
+    pad(widths_.value, value);
+    out += value;
+    out += "  ";
+    appendKey(out, key);
+    out += '\n';
+  }
+
+  void appendKey(std::string& out, std::string_view key) const {
+    constexpr std::size_t kNarrowestKey = 8;
+    const std::size_t taken = widths_.day + widths_.kind + widths_.value + 6;
+    const std::size_t room =
+        columns_ ? std::max(*columns_ - std::min(*columns_, taken), kNarrowestKey) : key.size() * 4;
+    const std::string escaped = isPlain(key) ? std::string() : printable(key);
+    std::string_view shown = escaped.empty() ? key : std::string_view(escaped);
+    if (!columns_ || displayWidth(shown) <= room) {
+      out += shown;
+      return;
+    }
+    std::string_view rest = shown;
+    for (std::size_t width = room - 1; width > 0; --width)
+      takeCodePoint(rest);
+    out += shown.substr(0, shown.size() - rest.size());
+    out += "…";
+  }
+
+  LineWriter& lines_;
+  const std::optional<std::size_t> columns_;
+  const std::size_t widestDay_;
+  DayTexts days_;
+  Widths widths_;
+  bool isMeasured_ = false;
+  std::vector<Row> rows_;  // until they are measured; their keys stand in `keys_`
+  std::vector<std::size_t> keySizes_;
+  std::string keys_;
+  std::string value_;
+};
+
+// The rows as elements of a JSON list, written as the library that writes the rest would.
+class JsonWriter {
+ public:
+  explicit JsonWriter(LineWriter& lines) : lines_(lines) {}
+
+  void beginList(std::string_view name) {
+    isEmpty_ = true;
+    lines_.buffer().append(",\n  \"").append(name).append("\": [");
+  }
+  void add(const Row& row) {
+    std::string& out = lines_.buffer();
+    out += isEmpty_ ? "\n    {\n      \"key\": " : ",\n    {\n      \"key\": ";
+    isEmpty_ = false;
+    if (isPlain(row.key)) {
+      out.append("\"").append(row.key).append("\"");
+    } else {
+      out += jsonText(Json(row.key), -1);
+    }
+    out += ",\n      \"day\": ";
+    appendNumber(out, row.day);
+    out.append(",\n      \"date\": \"").append(days_.date(row.day));
+    out += row.isScalar ? "\",\n      \"value\": " : "\",\n      \"count\": ";
+    appendNumber(out, row.number);
+    out += "\n    }";
+  }
+  void endList() { lines_.buffer() += isEmpty_ ? "]" : "\n  ]"; }
+
+ private:
+  LineWriter& lines_;
+  DayTexts days_;
+  bool isEmpty_ = true;
+};
+
+// Hands every row to `add`, scalars first; `between` is called after them.
+template <class Add, class Between>
+Status walk(SqliteHistory& history, const Selection& selection, LineWriter& lines, Add add,
+            Between between) {
+  bool goesOn = true;
+  Status walked = history.walkScalars(
+      selection.prefix, selection.first, selection.last,
+      [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
+        add(Row{true, day, value, key});
+        goesOn = lines.flushIfLarge();
+        stop = !goesOn;
+      });
+  between();
+  if (!walked || !goesOn) return walked;
+  return history.walkDistributions(selection.prefix, selection.first, selection.last,
+                                   [&](std::string_view key, std::int32_t day, std::int64_t count,
+                                       BHHistoryDistributionEnumerator&, bool& stop) {
+                                     add(Row{false, day, count, key});
+                                     stop = !lines.flushIfLarge();
+                                   });
+}
+
+Status printTable(ToolContext& context, SqliteHistory& history, const Selection& selection) {
+  const auto span = history.daysHeld();
+  if (!span) return span.error();
+  std::size_t widestDay = 0;
+  if (*span) {
+    widestDay = std::max(dayText((*span)->first).size(), dayText((*span)->last).size());
+  }
+  LineWriter lines(context.out());
+  TableWriter table(lines, context.columns(), widestDay);
+  const Status walked = walk(
+      history, selection, lines, [&](const Row& row) { table.add(row); }, [] {});
+  if (!table.finish() && walked) lines.buffer() += "no statistics\n";
+  return walked;
+}
+
+Status printJson(ToolContext& context, SqliteHistory& history, const Selection& selection) {
+  LineWriter lines(context.out());
+  JsonWriter json(lines);
+  std::string head = jsonText(withFormatVersion(Json::object()), 2);
+  head.resize(head.size() - 2);  // without the end of the object
+  lines.buffer() += head;
+  json.beginList("scalars");
+  const Status walked = walk(
+      history, selection, lines, [&](const Row& row) { json.add(row); },
+      [&] {
+        json.endList();
+        json.beginList("distributions");
+      });
+  json.endList();
+  lines.buffer() += "\n}\n";
+  return walked;
+}
+
+}  // namespace
+
+void listStatistics(ToolContext& context, const std::string& prefix,
+                    std::optional<std::int32_t> day) {
+  const auto history = context.storeForReading().openHistory();
+  if (!history) return context.fail(history.error().message);
+  const Selection selection{prefix, day.value_or(std::numeric_limits<std::int32_t>::min()),
+                            day.value_or(std::numeric_limits<std::int32_t>::max())};
+  const Status listed = context.json() ? printJson(context, **history, selection)
+                                       : printTable(context, **history, selection);
+  if (!listed) context.fail(listed.error().message);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,16 @@
+// What the store holds, as a table or as JSON, printed while it is read.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// Lists what is held of the keys that begin with `prefix`, of one day or of all.
+void listStatistics(ToolContext& context, const std::string& prefix,
+                    std::optional<std::int32_t> day);
+
+}  // namespace tavrel

@@ -1,0 +1,230 @@
+#include "tools/stat/stat_show.h"
+
+#include <algorithm>
+#include <functional>
+#include <limits>
+#include <nlohmann/json.hpp>
+#include <ostream>
+#include <vector>
+
+#include "base/format.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/distribution_view.h"
+#include "tools/shared/json_value.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
+#include "tools/stat/value_summary.h"
+
+namespace tavrel {
+namespace {
+
+constexpr int kPercents[] = {1, 5, 25, 50, 75, 95, 99};
+
+struct ScalarDay {
+  std::int32_t day;
+  std::int64_t value;
+};
+struct DistributionDay {
+  std::int32_t day;
+  Summary summary;
+};
+
+// Everything that is shown of a key. One key may be a scalar and a distribution.
+struct Statistic {
+  std::string key;
+  std::vector<ScalarDay> scalarDays;
+  std::vector<DistributionDay> distributionDays;
+  Summary summary;
+  std::vector<double> percentiles;
+  std::vector<DistributionView::Bucket> buckets;
+};
+
+struct Days {
+  std::int32_t first = std::numeric_limits<std::int32_t>::min();
+  std::int32_t last = std::numeric_limits<std::int32_t>::max();
+};
+
+Status forEachValue(SqliteHistory& history, const std::string& key, Days days,
+                    const std::function<void(std::int32_t day, double value)>& take) {
+  return history.walkDistribution(key, days.first, days.last,
+                                  [&](std::string_view, std::int32_t day, std::int64_t,
+                                      BHHistoryDistributionEnumerator& values, bool&) {
+                                    double value = 0;
+                                    std::uint32_t seconds = 0;
+                                    while (values.getNextValue(value, seconds))
+                                      take(day, value);
+                                  });
+}
+
+Expected<Statistic> readStatistic(SqliteHistory& history, const std::string& key, Days days) {
+  Statistic statistic;
+  statistic.key = key;
+  // Values are read several times; all of them the same ones.
+  if (Status begun = history.beginSnapshot(); !begun) return begun.error();
+  Status read =
+      history.walkScalar(key, days.first, days.last,
+                         [&](std::string_view, std::int32_t day, std::int64_t value, bool&) {
+                           statistic.scalarDays.push_back({day, value});
+                         });
+  if (!read) return read.error();
+  auto& perDay = statistic.distributionDays;
+  read = forEachValue(history, key, days, [&](std::int32_t day, double value) {
+    if (perDay.empty() || perDay.back().day != day) perDay.push_back({day, {}});
+    perDay.back().summary.add(value);
+    statistic.summary.add(value);
+  });
+  if (!read) return read.error();
+  if (statistic.summary.numbers() == 0) return statistic;
+
+  RoundHistogram histogram(statistic.summary);
+  PercentileSearch search(statistic.summary.numbers(), kPercents);
+  for (bool isFirstPass = true; search.needsPass(); isFirstPass = false) {
+    read = forEachValue(history, key, days, [&](std::int32_t, double value) {
+      if (isFirstPass) histogram.add(value);
+      search.add(value);
+    });
+    if (!read) return read.error();
+    search.endPass();
+  }
+  statistic.percentiles = search.values();
+  statistic.buckets = histogram.buckets();
+  return statistic;
+}
+
+// -- JSON ----------------------------------------------------------------------------------------
+
+Json jsonOfDay(std::int32_t day) {
+  return {{"day", day}, {"date", dayDateText(day)}};
+}
+
+Json jsonOfSummary(const Summary& summary) {
+  const auto known = [&](double value) {
+    return summary.numbers() == 0 ? Json(nullptr) : jsonOf(plist::Value(value));
+  };
+  return {{"count", summary.count()},
+          {"not_a_number", summary.notNumbers()},
+          {"minimum", known(summary.minimum())},
+          {"maximum", known(summary.maximum())},
+          {"mean", known(summary.mean())},
+          {"standard_deviation", known(summary.standardDeviation())}};
+}
+
+Json jsonOfScalar(const Statistic& statistic) {
+  if (statistic.scalarDays.empty()) return nullptr;
+  Json days = Json::array();
+  for (const ScalarDay& day : statistic.scalarDays) {
+    days.push_back(jsonOfDay(day.day));
+    days.back()["value"] = day.value;
+  }
+  return {{"days", std::move(days)}};
+}
+
+Json jsonOfDistribution(const Statistic& statistic) {
+  if (statistic.distributionDays.empty()) return nullptr;
+  Json distribution = jsonOfSummary(statistic.summary);
+  Json percentiles = Json::object();
+  for (std::size_t i = 0; i < statistic.percentiles.size(); ++i) {
+    percentiles[std::to_string(kPercents[i])] = jsonOf(plist::Value(statistic.percentiles[i]));
+  }
+  distribution["percentiles"] = std::move(percentiles);
+  Json histogram = Json::array();
+  for (const auto& bucket : statistic.buckets)
+    histogram.push_back({{"bucket", bucket.label}, {"count", bucket.count}});
+  distribution["histogram"] = std::move(histogram);
+  Json days = Json::array();
+  for (const DistributionDay& day : statistic.distributionDays) {
+    days.push_back(jsonOfDay(day.day));
+    days.back().update(jsonOfSummary(day.summary));
+  }
+  distribution["days"] = std::move(days);
+  return distribution;
+}
+
+// -- Text ----------------------------------------------------------------------------------------
+
+constexpr auto kRight = Table::Align::Right;
+
+void printScalar(ToolContext& context, const Statistic& statistic) {
+  const auto count = statistic.scalarDays.size();
+  context.out() << "Scalar " << printable(statistic.key) << ", " << counted(count, "day") << "\n\n";
+  Table table({{"DAY"}, {"VALUE", kRight}}, 2);
+  for (const ScalarDay& day : statistic.scalarDays)
+    table.add({dayText(day.day), std::to_string(day.value)});
+  table.print(context.out(), context.columns());
+}
+
+std::vector<std::string> cellsOf(const Summary& summary) {
+  std::vector<std::string> cells{std::to_string(summary.count())};
+  for (const double value : {summary.minimum(), summary.maximum(), summary.mean()})
+    cells.push_back(summary.numbers() == 0 ? "-" : shortNumber(value));
+  return cells;
+}
+
+void printDistribution(ToolContext& context, const Statistic& statistic) {
+  std::ostream& out = context.out();
+  const auto columns = context.columns();
+  const Summary& summary = statistic.summary;
+  out << "Distribution " << printable(statistic.key) << ", "
+      << counted(statistic.distributionDays.size(), "day") << "\n\n";
+  const std::vector<std::string> cells = cellsOf(summary);
+  Table facts({{""}, {"", kRight}}, 2);
+  facts.add({"Count", cells[0]});
+  if (summary.notNumbers() > 0) facts.add({"Not a number", std::to_string(summary.notNumbers())});
+  if (summary.numbers() > 0) {
+    facts.add({"Minimum", cells[1]});
+    for (std::size_t i = 0; i < statistic.percentiles.size(); ++i) {
+      facts.add({format("Percentile %d", kPercents[i]), shortNumber(statistic.percentiles[i])});
+    }
+    facts.add({"Maximum", cells[2]});
+    facts.add({"Mean", cells[3]});
+    facts.add({"Standard deviation", shortNumber(summary.standardDeviation())});
+  }
+  facts.print(out, columns);
+  if (!statistic.buckets.empty()) {
+    out << "\nHistogram\n";
+    printBuckets(out, statistic.buckets, columns);
+  }
+  out << '\n';
+  Table table(
+      {{"DAY"}, {"COUNT", kRight}, {"MINIMUM", kRight}, {"MAXIMUM", kRight}, {"MEAN", kRight}}, 2);
+  for (const DistributionDay& day : statistic.distributionDays) {
+    std::vector<std::string> row = cellsOf(day.summary);
+    row.insert(row.begin(), dayText(day.day));
+    table.add(std::move(row));
+  }
+  table.print(out, columns);
+}
+
+}  // namespace
+
+void showStatistic(ToolContext& context, const std::string& key,
+                   std::optional<std::uint32_t> days) {
+  Days range;
+  if (days) {
+    range.last = context.platform().statistics->BHDaysSince1970();
+    range.first = static_cast<std::int32_t>(
+        std::max(std::int64_t{range.last} - *days + 1, std::int64_t{range.first}));
+  }
+  const auto history = context.storeForReading().openHistory();
+  if (!history) return context.fail(history.error().message);
+  const auto statistic = readStatistic(**history, key, range);
+  if (!statistic) return context.fail(statistic.error().message);
+  const bool hasScalar = !statistic->scalarDays.empty();
+  const bool hasDistribution = !statistic->distributionDays.empty();
+  if (!hasScalar && !hasDistribution) {
+    const std::string when = days ? " in the last " + counted(*days, "day") : std::string();
+    return context.fail(format("no statistic %s%s: see 'tavrelctl stat list'", key, when));
+  }
+  if (context.json()) {
+    return context.printJson({{"key", key},
+                              {"scalar", jsonOfScalar(*statistic)},
+                              {"distribution", jsonOfDistribution(*statistic)}});
+  }
+  if (hasScalar) printScalar(context, *statistic);
+  if (hasScalar && hasDistribution) context.out() << '\n';
+  if (hasDistribution) printDistribution(context, *statistic);
+}
+
+}  // namespace tavrel
