@@ -37,6 +37,9 @@ std::int64_t daysFromCivil(const CivilDate& date);
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 
+/// Seconds since midnight UTC, for any 64-bit instant.
+unsigned secondOfDay(std::int64_t seconds);
+
 /// True for a date that the calendar has.
 bool isValid(const CivilDate& date);
 

@@ -2,9 +2,9 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
+#include "base/base64.h"
 #include "base/format.h"
 #include "device.h"
-#include "tools/shared/base64.h"
 
 namespace tavrel {
 namespace {
@@ -37,7 +37,9 @@ nlohmann::ordered_json jsonOf(const Outcome& outcome) {
 // A device whose driver answers with `statistics`.
 void record(const TemporaryDevice& device, const std::string& statistics) {
   const auto data = [](const std::string& bytes) {
-    return R"({"$data": ")" + base64Text(asBytes(bytes)) + "\"}";
+    std::string text = R"({"$data": ")";
+    appendBase64(text, asBytes(bytes));
+    return text + "\"}";
   };
   device.write("/var/lib/tavrel/registry/storage.plist",
                xmlOf(R"({"Services": [{"Class": "ASPStorage", "Methods": [

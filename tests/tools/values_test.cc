@@ -1,11 +1,10 @@
-// The small parts of the tool: values as JSON, days, dates, tables.
+// The small parts of the tool: values as JSON, days, tables.
 #include <cmath>
 #include <gtest/gtest.h>
 #include <limits>
 #include <nlohmann/json.hpp>
 #include <sstream>
 
-#include "tools/shared/base64.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
@@ -64,33 +63,6 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
   const auto cut = parseJsonValue("{\"a\":\n [1,");
   ASSERT_FALSE(cut);
   EXPECT_NE(cut.error().message.find("line 2, column 5"), std::string::npos) << cut.error().message;
-}
-
-TEST(Base64, RefusesWrongLengthsAndPadding) {
-  for (const std::string_view text :
-       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="}) {
-    EXPECT_FALSE(parseBase64(text)) << text;
-  }
-  for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
-    std::vector<std::byte> bytes(size);
-    for (std::size_t i = 0; i < size; ++i)
-      bytes[i] = static_cast<std::byte>(255 - i);
-    EXPECT_EQ(parseBase64("\n " + base64Text(bytes)), bytes);
-  }
-}
-
-TEST(Dates, AreReadAsTheyAreWritten) {
-  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
-    const auto date = plist::Date::sinceEpoch(seconds);
-    const auto back = parseIsoDate(isoDateText(date));
-    ASSERT_TRUE(back) << back.error().message;
-    EXPECT_EQ(*back, date) << isoDateText(date);
-  }
-  for (const std::string_view text :
-       {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
-        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"}) {
-    EXPECT_FALSE(parseIsoDate(text)) << text;
-  }
 }
 
 TEST(Days, AreNumbersOrDates) {

@@ -8,6 +8,7 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/limits.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"

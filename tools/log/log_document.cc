@@ -1,17 +1,19 @@
 #include "tools/log/log_document.h"
 
-#include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
+#include "base/civil_time.h"
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/text.h"
 #include "platform/linux/logs/file_submission.h"
 #include "tools/log/log_faults.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/sorted_entries.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
@@ -42,7 +44,7 @@ Json jsonField(const plist::Value& value) {
 std::optional<std::int32_t> dayOf(const plist::Dictionary& log) {
   const auto start = log.date("BHStartDate");
   if (!start) return std::nullopt;
-  const double day = std::floor(start->secondsSince1970() / 86400.0);
+  const double day = std::floor(start->secondsSince1970() / static_cast<double>(kSecondsPerDay));
   if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
   return static_cast<std::int32_t>(day);
 }
@@ -57,13 +59,8 @@ void printValues(std::ostream& out, std::string_view title, const plist::Diction
                  Table::Align align, std::optional<std::size_t> columns) {
   if (values.empty()) return;
   out << format("\n%s (%zu)\n", title, values.size());
-  std::vector<const plist::Entry*> entries;
-  for (const plist::Entry& entry : values)
-    entries.push_back(&entry);
-  std::sort(entries.begin(), entries.end(),
-            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
   Table table({{""}, {"", align}}, 2);
-  for (const plist::Entry* entry : entries) {
+  for (const plist::Entry* entry : sortedEntries(values)) {
     table.add({std::string(entry->key.view()), fieldText(entry->value)});
   }
   table.print(out, columns);

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/files/file_system.h"

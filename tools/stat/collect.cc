@@ -172,10 +172,8 @@ class Collector {
   void read() {
     Platform& platform = context_.platform();
     const auto now = saturatingInt64(std::floor(platform.clock->now().secondsSince1970()));
-    const std::int64_t secondsInDay = (now % kSecondsPerDay + kSecondsPerDay) % kSecondsPerDay;
-    readings_.push_back({platform.statistics->BHDaysSince1970(),
-                         static_cast<std::uint32_t>(secondsInDay), std::chrono::steady_clock::now(),
-                         readMachine(context_.root())});
+    readings_.push_back({platform.statistics->BHDaysSince1970(), secondOfDay(now),
+                         std::chrono::steady_clock::now(), readMachine(context_.root())});
     ++count_;
   }
 
