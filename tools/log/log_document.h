@@ -1,8 +1,7 @@
 // A tallied log as people and programs read it.
 #pragma once
 
-#include <cstddef>
-#include <iosfwd>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <utility>
@@ -20,18 +19,19 @@ struct LogEnvelope {
   plist::Dictionary metadata;
 };
 
+/// The day that a log reports.
+std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log);
+
 /// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
-/// a tallied log has it. `document` is the
-/// log when it is a property list.
-void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dictionary& document,
-              std::optional<std::size_t> columns);
+/// a tallied log has it. `document` is the log when it is a property list.
+void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictionary& document);
 
 /// The same facts. The standard deviation is that of the values themselves: the root of the sum of
 /// squared deviations divided by the count.
 Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document);
 
 /// The lines of a log's envelope, which also stand before logs of other forms.
-void printEnvelope(std::ostream& out, const LogEnvelope& envelope);
+void printEnvelope(const Page& page, const LogEnvelope& envelope);
 Json jsonOfEnvelope(const LogEnvelope& envelope);
 
 }  // namespace tavrel

@@ -14,7 +14,6 @@ namespace tavrel {
 Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters);
 
 /// Error bins as bars, the other arrays in rows of eight; arrays of zeros on one line.
-void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
-                   std::optional<std::size_t> columns);
+void printCounters(const Page& page, std::string_view parser, const TelemetryCounters& counters);
 
 }  // namespace tavrel

@@ -102,8 +102,7 @@ void list(ToolContext& context, const Arguments& arguments) {
     addChannels(list, *channels);
     return list.end();
   }
-  if (IOReportGetChannelCount(*channels) == 0) context.note("no such channel is published");
-  printChannels(context.out(), *channels, arguments.flat, context.columns());
+  printChannels(context.page(), *channels, arguments.flat);
 }
 
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
@@ -121,7 +120,7 @@ void printOne(ToolContext& context, const Arguments& arguments, const plist::Dic
       const char* const what = arguments.delta ? "Change" : "Sample";
       context.out() << format("%s %u of %u\n", what, number, arguments.count);
     }
-    printSamples(context.out(), samples, arguments.delta, context.columns());
+    printSamples(context.page(), samples, arguments.delta);
   }
   context.out().flush();
 }
