@@ -20,7 +20,7 @@ std::optional<std::size_t> terminalColumns() {
   return size.ws_col;
 }
 
-// As users of other tools have learnt it: no-color.org.
+// NO_COLOR as no-color.org describes it.
 bool isColoured() {
   if (!isatty(STDOUT_FILENO)) return false;
   const char* const refusal = std::getenv("NO_COLOR");

@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// What text makes of a figure: this many of JSON's are one of the unit behind it.
+// Units that text converts to: one of them is so many of what JSON counts.
 constexpr std::pair<std::string_view, double> kUnits[] = {
     {"%", 0.01},     {"KiB", 0x1p10}, {"MiB", 0x1p20}, {"GiB", 0x1p30}, {"TiB", 0x1p40},
     {"PiB", 0x1p50}, {"EiB", 0x1p60}, {"ns", 1e-9},    {"µs", 1e-6},    {"ms", 1e-3},
@@ -220,8 +220,8 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       {"report", "sample"},
       {"report", "sample", "--delta", "--interval", "0"},
   };
-  // What they print differs from run to run (disk space, identifiers), they change what they print
-  // of, or the text is a document of its own.
+  // Commands whose two outputs cannot be compared: each run differs (disk space, identifiers), a
+  // run changes what the next one prints, or the text is a document of its own.
   std::set<std::string> covered{"log preview", "notify post", "notify wait", "rehearse",
                                 "stat import"};
   for (const Words& command : kCommands) {
