@@ -58,10 +58,8 @@ std::int64_t daysFromCivil(const CivilDate& date) {
 
 CivilTime civilFromSeconds(std::int64_t seconds) {
   const std::int64_t days = floorDivide(seconds, kSecondsPerDay);
-  const std::int64_t remainder = seconds % kSecondsPerDay;
-  const auto secondOfDay =
-      static_cast<unsigned>(remainder < 0 ? remainder + kSecondsPerDay : remainder);
-  return {civilFromDays(days), secondOfDay / 3600, secondOfDay / 60 % 60, secondOfDay % 60};
+  const unsigned second = secondOfDay(seconds);
+  return {civilFromDays(days), second / 3600, second / 60 % 60, second % 60};
 }
 
 std::int64_t secondsFromCivil(const CivilTime& time) {
@@ -69,6 +67,11 @@ std::int64_t secondsFromCivil(const CivilTime& time) {
   const auto days = static_cast<std::uint64_t>(daysFromCivil(time.date));
   return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600 + time.minute * 60 +
                                    time.second);
+}
+
+unsigned secondOfDay(std::int64_t seconds) {
+  const std::int64_t remainder = seconds % kSecondsPerDay;
+  return static_cast<unsigned>(remainder < 0 ? remainder + kSecondsPerDay : remainder);
 }
 
 bool isValid(const CivilDate& date) {

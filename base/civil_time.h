@@ -37,7 +37,10 @@ std::int64_t daysFromCivil(const CivilDate& date);
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 
-/// True when the date exists in the calendar.
+/// Seconds since midnight UTC, for any 64-bit instant.
+unsigned secondOfDay(std::int64_t seconds);
+
+/// True for a date that the calendar has.
 bool isValid(const CivilDate& date);
 
 /// "2026-11-16"; years outside 0 to 9999 are written in full, with their sign when negative.

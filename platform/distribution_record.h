@@ -4,11 +4,13 @@
 // little-endian. Records are adjacent, in the order of recording, at any alignment.
 #pragma once
 
+#include <array>
 #include <bit>
 #include <cstddef>
 #include <cstdint>
-#include <cstring>
 #include <string>
+
+#include "base/bytes.h"
 
 namespace tavrel {
 
@@ -19,34 +21,17 @@ struct DistributionSample {
   std::uint32_t secondsInDayOffset = 0;
 };
 
-namespace record_detail {
-
-template <class Word>
-Word reversedOnBigEndian(Word word) {
-  if constexpr (std::endian::native == std::endian::little) return word;
-  if constexpr (sizeof(Word) == 8) return __builtin_bswap64(word);
-  return static_cast<Word>(__builtin_bswap32(static_cast<std::uint32_t>(word)));
-}
-
-}  // namespace record_detail
-
 inline void appendDistributionRecord(std::string& records, const DistributionSample& sample) {
-  const auto bits = record_detail::reversedOnBigEndian(std::bit_cast<std::uint64_t>(sample.value));
-  const auto seconds = record_detail::reversedOnBigEndian(sample.secondsInDayOffset);
-  char record[kDistributionRecordBytes];
-  std::memcpy(record, &bits, sizeof bits);
-  std::memcpy(record + sizeof bits, &seconds, sizeof seconds);
-  records.append(record, sizeof record);
+  std::array<std::byte, kDistributionRecordBytes> record;
+  storeLittle64(record, 0, std::bit_cast<std::uint64_t>(sample.value));
+  storeLittle32(record, 8, sample.secondsInDayOffset);
+  records += asText(record);
 }
 
 /// The record of `kDistributionRecordBytes` at `record`.
 inline DistributionSample distributionSampleAt(const char* record) {
-  std::uint64_t bits = 0;
-  std::uint32_t seconds = 0;
-  std::memcpy(&bits, record, sizeof bits);
-  std::memcpy(&seconds, record + sizeof bits, sizeof seconds);
-  return {std::bit_cast<double>(record_detail::reversedOnBigEndian(bits)),
-          record_detail::reversedOnBigEndian(seconds)};
+  const ByteSpan bytes = asBytes({record, kDistributionRecordBytes});
+  return {std::bit_cast<double>(*loadLittle64(bytes, 0)), *loadLittle32(bytes, 8)};
 }
 
 }  // namespace tavrel

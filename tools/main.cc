@@ -1,6 +1,8 @@
+#include <cstdlib>
 #include <iostream>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <sys/ioctl.h>
 #include <unistd.h>
 #include <vector>
@@ -17,6 +19,15 @@ std::optional<std::size_t> terminalColumns() {
   return size.ws_col;
 }
 
+// NO_COLOR as no-color.org describes it.
+bool isColoured() {
+  if (!isatty(STDOUT_FILENO)) return false;
+  const char* const refusal = std::getenv("NO_COLOR");
+  const char* const terminal = std::getenv("TERM");
+  return (refusal == nullptr || *refusal == '\0') && terminal != nullptr &&
+         std::string_view(terminal) != "dumb";
+}
+
 }  // namespace
 
 int main(int argc, char** argv) {
@@ -26,5 +37,6 @@ int main(int argc, char** argv) {
                                .out = std::cout,
                                .error = std::cerr,
                                .columns = terminalColumns(),
-                               .errorIsTerminal = isatty(STDERR_FILENO) == 1});
+                               .errorIsTerminal = isatty(STDERR_FILENO) == 1,
+                               .outIsColoured = isColoured()});
 }

@@ -5,16 +5,8 @@
 #include <cstdint>
 #include <limits>
 
-#include "base/civil_time.h"
-#include "base/format.h"
-
 namespace tavrel::plist {
 namespace {
-
-constexpr auto kEpoch = static_cast<std::int64_t>(Date::kEpoch);
-
-// Seconds from the epoch to the ends of the calendar of base/civil_time.h, rounded up.
-constexpr double kLargestSeconds = 3.2e16;
 
 template <class Value>
 void append(std::string& out, Value value) {
@@ -37,14 +29,6 @@ bool takePrefix(std::string_view& text, std::string_view prefix) {
   if (!text.starts_with(prefix)) return false;
   text.remove_prefix(prefix.size());
   return true;
-}
-
-// Two digits at `position` that do not exceed `largest`.
-std::optional<unsigned> parseTwoDigits(std::string_view text, std::size_t position,
-                                       unsigned largest) {
-  const auto value = parse<unsigned>(text.substr(position, 2));
-  if (!value || *value > largest) return std::nullopt;
-  return value;
 }
 
 }  // namespace
@@ -82,32 +66,6 @@ std::optional<double> parseReal(std::string_view text) {
   if (takePrefix(text, "+") && text.starts_with('-')) return std::nullopt;
   if (text.ends_with(')')) return std::nullopt;  // "nan(...)"
   return parse<double>(text);
-}
-
-bool appendDate(std::string& out, Date date) {
-  const double seconds = std::floor(date.secondsSinceEpoch());
-  if (!(std::abs(seconds) <= kLargestSeconds)) return false;
-  const CivilTime time = civilFromSeconds(static_cast<std::int64_t>(seconds) + kEpoch);
-  if (!isValid(time.date)) return false;
-  out += dateText(time.date);
-  appendFormat(out, "T%02u:%02u:%02uZ", time.hour, time.minute, time.second);
-  return true;
-}
-
-std::optional<Date> parseDate(std::string_view text) {
-  constexpr std::string_view kTime = "T00:00:00Z";
-  if (text.size() < kTime.size()) return std::nullopt;
-  const std::string_view time = text.substr(text.size() - kTime.size());
-  for (const std::size_t position : {0U, 3U, 6U, 9U}) {
-    if (time[position] != kTime[position]) return std::nullopt;
-  }
-  const auto date = tavrel::parseDate(text.substr(0, text.size() - kTime.size()));
-  const auto hour = parseTwoDigits(time, 1, 23);
-  const auto minute = parseTwoDigits(time, 4, 59);
-  const auto second = parseTwoDigits(time, 7, 59);
-  if (!date || !hour || !minute || !second) return std::nullopt;
-  const std::int64_t seconds = secondsFromCivil({*date, *hour, *minute, *second});
-  return Date::sinceEpoch(static_cast<double>(seconds - kEpoch));
 }
 
 }  // namespace tavrel::plist

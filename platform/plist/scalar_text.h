@@ -1,4 +1,4 @@
-// Numbers and dates as the XML encoding of property lists writes them.
+// Numbers as the XML encoding of property lists writes them.
 #pragma once
 
 #include <optional>
@@ -19,12 +19,5 @@ std::optional<Number> parseInteger(std::string_view text);
 /// A decimal number, "nan", "inf" or "infinity" in either case, with an optional sign; nothing for
 /// any other text and for a number beyond the range of a double.
 std::optional<double> parseReal(std::string_view text);
-
-/// Appends "2026-11-16T18:02:18Z", rounded down to the second. For a date beyond the calendar,
-/// appends nothing and returns false.
-bool appendDate(std::string& out, Date date);
-
-/// Reads the form that `appendDate` writes.
-std::optional<Date> parseDate(std::string_view text);
 
 }  // namespace tavrel::plist

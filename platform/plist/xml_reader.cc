@@ -11,9 +11,10 @@
 #include <utility>
 #include <vector>
 
+#include "base/base64.h"
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/limits.h"
-#include "platform/plist/base64.h"
 #include "platform/plist/encodable_text.h"
 #include "platform/plist/scalar_text.h"
 #include "platform/plist/xml.h"
@@ -255,7 +256,7 @@ void XmlReader::endScalar() {
       if (const auto number = parseReal(trimmed(text_))) return add(*number);
       return fail("\"" + excerpt(text_) + "\" is no real number that a double holds");
     case Element::Date:
-      if (const auto date = parseDate(trimmed(text_))) return add(*date);
+      if (const auto date = parseIsoInstant(trimmed(text_))) return add(*date);
       return fail("\"" + excerpt(text_) + "\" is no date of the form YYYY-MM-DDTHH:MM:SSZ");
     case Element::Data:
       if (readBase64(text_, data_)) return add(Data(data_));

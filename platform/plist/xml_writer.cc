@@ -4,7 +4,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/plist/base64.h"
+#include "base/base64.h"
+#include "base/iso_date.h"
 #include "platform/plist/encodable_text.h"
 #include "platform/plist/encoding_walk.h"
 #include "platform/plist/scalar_text.h"
@@ -46,7 +47,8 @@ class XmlWriter {
       }
       case Kind::Date:
         open("date");
-        if (!appendDate(out_, *value.date())) return guard_.fail("no calendar reaches the date");
+        if (!appendIsoInstant(out_, *value.date()))
+          return guard_.fail("no calendar reaches the date");
         close("date");
         break;
       case Kind::String:

@@ -2,9 +2,9 @@
 #include <gtest/gtest.h>
 #include <nlohmann/json.hpp>
 
+#include "base/base64.h"
 #include "base/format.h"
 #include "device.h"
-#include "tools/shared/base64.h"
 
 namespace tavrel {
 namespace {
@@ -37,7 +37,9 @@ nlohmann::ordered_json jsonOf(const Outcome& outcome) {
 // A device whose driver answers with `statistics`.
 void record(const TemporaryDevice& device, const std::string& statistics) {
   const auto data = [](const std::string& bytes) {
-    return R"({"$data": ")" + base64Text(asBytes(bytes)) + "\"}";
+    std::string text = R"({"$data": ")";
+    appendBase64(text, asBytes(bytes));
+    return text + "\"}";
   };
   device.write("/var/lib/tavrel/registry/storage.plist",
                xmlOf(R"({"Services": [{"Class": "ASPStorage", "Methods": [
@@ -58,51 +60,46 @@ TEST(NandInfo, GroupsWhatTheDriverAnswers) {
   const TemporaryDevice device;
   record(device, built(device, kStatistics));
   EXPECT_EQ(device.run({"nand", "info"}), prints(R"(Device
-  ExportVersion        131075  0x20003
-  DriverVersion            -1
-  DemoMode                  0
-  formatDaysSince2000       0  weeks
-  NumSleepOps               0
+  ExportVersion  131075  0x20003
+  DriverVersion      -1
 
 Geometry
-  NumVirtualBlocks        1024  of 32.0 MiB, 32.0 GiB in all
-  BlocksPerVirtualBlock      0
-  PagesPerVirtualBlock    2048
-  BytesPerPage           16384
-  NumFreeVirtualBlocks      93  9.1 %
-  NodesTotal                 0
-  NodesFree                  0
+  NumVirtualBlocks       1024  of 32.0 MiB, 32.0 GiB in all
+  PagesPerVirtualBlock   2048
+  BytesPerPage          16384
+  NumFreeVirtualBlocks     93  9.1 %
 
 Wear
-  NumPhysicalErases               250
-  NumWearLevelOps                   0
-  HighEnduranceBlockEraseCount      0
-  NumMaintenanceRequests            0
-  MaintenanceRequestsFailedErase    0
-  MaintenanceRequestsFailedProg     0
-  MaintenanceRequestsFailedRead     0
+  NumPhysicalErases  250
 
 Traffic
-  NumLogicalReads         -1
-  NumLogicalWrites   1000000  sectors of 4 KiB: 3.8 GiB
-  NumPhysicalReads         0
-  NumPhysicalWrites        0
-  NumGCWrites              7
+  NumLogicalReads        -1
+  NumLogicalWrites  1000000  sectors of 4 KiB: 3.8 GiB
+  NumGCWrites             7
 
 Write amplification
   2.05  erases x virtual block / logical writes
 
-BandsMaxTempHisto: 3 buckets, all 0
-
 ReadsBeforeErasure
-  0                 8  ########################################
-  50000             4  ####################
-  100000            2  ##########
+  0                 8  #########################################################
+  50000             4  ############################
+  100000            2  ##############
   150000 to 200000  0
+
+17 figures are 0; --all shows them
 )"));
 
+  const Outcome all = device.run({"nand", "info", "--all"});
+  EXPECT_EQ(std::count(all.out.begin(), all.out.end(), '\n'), 42) << all;
+  EXPECT_NE(all.out.find("\nBandsMaxTempHisto: 3 buckets, all 0\n"), std::string::npos) << all;
+
   const auto json = jsonOf(device.run({"nand", "info", "--json"}));
-  EXPECT_EQ(json.size(), 33U) << json;
+  EXPECT_EQ(json.size(), 34U) << json;
+  EXPECT_EQ(json["derived"].dump(),
+            R"({"virtual_block_bytes":33554432,"capacity_bytes":34359738368,)"
+            R"("free_virtual_blocks_share":0.0908203125,"free_nodes_share":null,)"
+            R"("logical_read_bytes":null,"logical_write_bytes":4096000000,)"
+            R"("write_amplification":2.048,"formatted_from":null,"figures_at_zero":17})");
   EXPECT_EQ(json["com.norvane.NANDInfo.NumLogicalReads"], -1);
   EXPECT_EQ(json["com.norvane.NANDInfo.BandsMaxTempHisto2"], 0);
 
@@ -111,7 +108,7 @@ ReadsBeforeErasure
   const Outcome old = device.run({"nand", "info"});
   EXPECT_EQ(old.status, 0) << old;
   EXPECT_EQ(old.out.find("amplification"), std::string::npos) << old;
-  EXPECT_EQ(jsonOf(device.run({"nand", "info", "--json"})).size(), 16U);
+  EXPECT_EQ(jsonOf(device.run({"nand", "info", "--json"})).size(), 17U);
 }
 
 TEST(NandInfo, AFailureIsNoZero) {
@@ -144,8 +141,9 @@ TEST(NandParse, ReadsBackWhatWasBuilt) {
   EXPECT_EQ(first, words({53,  1, 131075, 1, 4, 1, 1, 0, 4,   1, 0xFFFFFFFF, 0xFFFFFFFF,
                           265, 3, 1,      0, 2, 0, 3, 0, 54,  1, 9,          0,
                           21,  3, 5,      0, 5, 0, 5, 0, 184, 0}));
-  EXPECT_EQ(device.run({"nand", "parse", "-"}, first),
-            prints(R"(STATISTIC                       VALUE
+  EXPECT_EQ(
+      device.run({"nand", "parse", "-"}, first),
+      (Outcome{0, R"(STATISTIC                       VALUE
 exportVersion              4295098371
 hostWrites                          1
 hostWrites       18446744073709551615
@@ -153,8 +151,11 @@ readCountHisto0                     1
 readCountHisto1                     2
 readCountHisto2                     3
 ECBins                              9
-)"));
-  const Outcome parsed = device.run({"nand", "parse", "-", "--json"}, first);
+)",
+               "tavrelctl: standard input: 2 records not listed: of unknown statistics, without "
+               "values or with too many: --json prints them whole\n"}));
+  const Outcome parsed = device.run({"nand", "parse", "-", "--json"}, first + "\xab");
+  EXPECT_EQ(device.run({"nand", "build", "-", "-o", "-"}, parsed.out), prints(first + "\xab"));
   EXPECT_EQ(jsonOf(parsed).dump(),
             R"({"format_version":1,"result":1,"fields":{"exportVersion":131075,)"
             R"("driverVersion":4294967295,"numVirtualBlocks":0,"blocksPerVirtualBlock":0,)"
@@ -164,11 +165,8 @@ ECBins                              9
             R"("utilFormatTime":0,"numSleepOps":0,"maxHighEnduranceBlockErases":0,)"
             R"("readCountHisto":[1,2,3,0,0]},"entries":[["exportVersion",4295098371],)"
             R"(["hostWrites",1],["hostWrites",18446744073709551615],["readCountHisto0",1],)"
-            R"(["readCountHisto1",2],["readCountHisto2",3],["ECBins",9]]})");
-
-  // What was parsed is itself a form to build from.
-  const Outcome again = device.run({"nand", "build", "-", "-o", "-"}, parsed.out);
-  EXPECT_EQ(device.run({"nand", "parse", "-", "--json"}, again.out), parsed);
+            R"(["readCountHisto1",2],["readCountHisto2",3],["ECBins",9],)"
+            R"({"key":21,"values":[5,5,5]},{"key":"TempSensorMax","values":[]},{"hex":"ab"}]})");
 }
 
 TEST(NandParse, SaysWhereABufferIsBroken) {
@@ -190,7 +188,10 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
         second + "0x30000001 is above 0x30000000, the largest number of a statistic");
   parse(good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])", 1,
         second + "statistic 54 has 4294967295 values, but there is room for 1");
-  EXPECT_EQ(device.run({"nand", "parse", "-"}, built(device, good + "[805306368, []]]")).error, "");
+  EXPECT_EQ(
+      device.run({"nand", "parse", "-"}, built(device, good + "[805306368, []]]")).error,
+      "tavrelctl: standard input: 1 record not listed: of unknown statistics, without values or "
+      "with too many: --json prints them whole\n");
   EXPECT_EQ(device.run({"nand", "parse", "-"}, words({4, 1, 1, 0, 0})),
             (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
                      "tavrelctl: standard input: the last 4 bytes are no whole unit of 8 and were "
@@ -225,7 +226,7 @@ ECBins            -                     1
   EXPECT_EQ(json["differences"][4].dump(),
             R"({"statistic":"shutdowns","before":0,"after":18446744073709551615,"change":null})");
   EXPECT_EQ(device.run({"nand", "parse", device.path("/a"), "--diff", device.path("/a")}),
-            prints(""));
+            prints("no differences among the statistics that have a name\n"));
 }
 
 TEST(NandBuild, NamesThePlaceOfAMistake) {
@@ -323,6 +324,9 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   const std::string wide = std::string(4095, ' ');
   EXPECT_EQ(device.run(command, words({7, 0, 8})), prints("%s\n" + wide + "7|\n" + wide + "8|\n"));
 
+  EXPECT_EQ(device.run({"nand", "snapshot", "-"}, std::string(100, 'x')),
+            fails("standard input holds no whole record: it has 100 bytes, and a record has 252: "
+                  "give a timeline of the controller, and --descriptor if one came with it"));
   EXPECT_EQ(device.run(command, words({7, 0})),
             fails("cannot render " + device.path("/wide") +
                   ": field 0 of the last of 3 records ends at byte 12 of a buffer of 8"));

@@ -2,6 +2,7 @@
 #include <csignal>
 #include <functional>
 #include <nlohmann/json.hpp>
+#include <unistd.h>
 
 #include "base/format.h"
 #include "device.h"
@@ -23,8 +24,8 @@ const std::string kTelemetryLine =
 
 TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
   const TemporaryDevice device;
-  EXPECT_EQ(device.run({"records", "list"}), prints(""));
-  EXPECT_EQ(device.run({"records", "show"}), prints(""));
+  EXPECT_EQ(device.run({"records", "list"}), prints("no records\n"));
+  EXPECT_EQ(device.run({"records", "show"}), prints("no records\n"));
   EXPECT_EQ(device.run({"records", "show", "--json"}).out,
             "{\n  \"format_version\": 1,\n  \"records\": []\n}\n");
 
@@ -45,12 +46,10 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
                            "first is line 5\n";
   EXPECT_EQ(device.run({"records", "list"}),
             (Outcome{1,
-                     format("TYPE  DAY                 RECORDS  BYTES\n"
-                            " 176  20759 (2026-11-02)        1     %zu\n"
-                            " 172  20784 (2026-11-27)        4   %zu\n"
-                            " 176  20784 (2026-11-27)        1    %zu\n",
-                            recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}").size(),
-                            ecc.size(), kTelemetryLine.size() + 1),
+                     "TYPE  DAY                 RECORDS       SIZE\n"
+                     " 176  20759 (2026-11-02)        1   76 bytes\n"
+                     " 172  20784 (2026-11-27)        4    5.0 KiB\n"
+                     " 176  20784 (2026-11-27)        1  104 bytes\n",
                      torn}));
   const Outcome all = device.run({"records", "show"});
   EXPECT_EQ(all.status, 1);
@@ -204,6 +203,25 @@ Next log        the next run may write one; the last was written 2026-01-01 00:0
   EXPECT_EQ(document["log"]["write_amplification"],
             nlohmann::json::parse(R"({"UserWamp": 2.05, "IntermediateWamp": "inf"})"));
   EXPECT_EQ(document["log"]["date"], "2026-11-16 18:02:18 +0000");
+
+  // Without its metadata a log is known by its name.
+  device.write(outbox + "StorageStatus-9.log", "x");
+  std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
+  std::filesystem::permissions(device.path(outbox) + "StorageStatus-9.log",
+                               std::filesystem::perms::none);
+  for (const char* part : {"6T17", "6T18", "7T18"})
+    std::filesystem::remove(device.path(outbox) + part + ".log");
+  const uid_t user = geteuid();
+  if (user == 0) {
+    ASSERT_EQ(seteuid(65534), 0);  // who may read anything sees no refusal
+  }
+  const Outcome refused = device.run({"nandlog", "show"});
+  ASSERT_EQ(seteuid(user), 0);
+  EXPECT_EQ(refused.status, 1);
+  EXPECT_NE(refused.error.find("cannot read " + device.path(outbox) +
+                               "StorageStatus-9.log: Permission denied"),
+            std::string::npos)
+      << refused;
 
   file("8T18", "165", "no log\n\nof the form");
   EXPECT_EQ(device.run({"nandlog", "show"}),

@@ -92,16 +92,16 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
             prints(R"(flash0 <id 0x100000201>
   NAND
     Traffic
-      Host reads   81200000  4KiB
-      Host writes  40100000  4KiB
+      Host reads   309.8 GiB
+      Host writes  153.0 GiB
     Latency
       Read latency (us)
         (0, 2]          0
         (2, 4]          0
         (4, 8]          0
-        (8, 16]        10  #                         mean 13.0, 9 to 15
-        (16, 32]      700  ########################  mean 24.3, 17 to 32
-        (32, 1000]     40  #                         mean 225.0, 60 to 900
+        (8, 16]        10  #                               mean 13.0, 9 to 15
+        (16, 32]      700  ##############################  mean 24.3, 17 to 32
+        (32, 1000]     40  #                               mean 225.0, 60 to 900
         (1000, 2000]    0
     Errors
       Corrected per die (events)
@@ -109,11 +109,11 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
         [4]  0  2  -  -
   Power
     Power state (24Mticks)
-      ACTV  12.0%  ##                120.000 s  entered 900
-      IDLE  70.0%  ################  700.000 s  entered 950  current
-      SLP   18.0%  ####              180.000 s   entered 50
+      ACTV  12.0 %  ###                              120 s  entered 900
+      IDLE  70.0 %  #####################            700 s  entered 950  current
+      SLP   18.0 %  #####                            180 s   entered 50
   Temperature
-    Controller  41250  mC
+    Controller  41.3 °C
 )"));
   EXPECT_EQ(device.run({"report", "sample", "--category", "2", "--delta", "--count", "2",
                         "--interval", "0"}),
@@ -121,21 +121,21 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
 flash0 <id 0x100000201>
   Power
     Power state (24Mticks)
-      ACTV  20.0%  ####                 0.200 s  entered 4  current
-      IDLE  80.0%  ###################  0.800 s  entered 3
-      SLP    0.0%                       0.000 s  entered 0
+      ACTV  20.0 %  ######                            200 ms  entered 4  current
+      IDLE  80.0 %  #########################         800 ms  entered 3
+      SLP    0.0 %                                       0 s  entered 0
   Temperature
-    Controller  250  mC
+    Controller  0.25 °C
 
 Change 2 of 2
 flash0 <id 0x100000201>
   Power
     Power state (24Mticks)
-      ACTV  30.0%  #######         0.300 s  entered 5
-      IDLE  10.0%  ##              0.100 s  entered 4
-      SLP   60.0%  ##############  0.600 s  entered 1  current
+      ACTV  30.0 %  #########                         300 ms  entered 5
+      IDLE  10.0 %  ###                               100 ms  entered 4
+      SLP   60.0 %  ###################               600 ms  entered 1  current
   Temperature
-    Controller  -125  mC
+    Controller  -0.125 °C
 )"));
   // Whatever is printed piece by piece looks as if it had been printed at once.
   for (const auto& [arguments, indent] : {std::pair(std::vector<std::string>{"list"}, 2),
@@ -159,9 +159,10 @@ flash0 <id 0x100000201>
     "driver": "flash0 <id 0x100000201>", "driver_id": 4294967809, "group": "NAND",
     "subgroup": "Traffic", "name": "Host reads", "id": 79643515572836, "format": "simple",
     "categories": 257, "elements": 1, "unit": 648672277969240068, "unit_label": "4KiB",
-    "timestamp": 24000000000, "value": 81200000})"));
+    "timestamp": 24000000000, "value": 81200000,
+    "converted": {"value": 332595200000.0, "unit": "bytes"}})"));
   EXPECT_EQ(channels[2]["buckets"][5], nlohmann::json::parse(R"({"lower": 32, "upper": 1000,
-    "hits": 40, "minimum": 60, "maximum": 900, "sum": 9000})"));
+    "hits": 40, "minimum": 60, "maximum": 900, "sum": 9000, "mean": 225.0})"));
   EXPECT_TRUE(channels[2]["buckets"][0]["sum"].is_null());
   EXPECT_EQ(channels[3]["values"], nlohmann::json::parse("[3, 0, 7, 1, 0, 2, null, null]"));
 }
@@ -186,16 +187,17 @@ TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
                                   ->dictionary();
   recorded.dictionary("Hub").array("Channels").at(0).dictionary().set("Elements", groups);
   play(recorded);
-  EXPECT_EQ(device.run({"report", "sample", "--count", "2", "--interval", "0"}),
-            prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0%  "
-                   "########################  5  entered 5\n\n"
-                   "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0%  "
-                   "########################  18446744073709551615  entered "
-                   "18446744073709551615\n"));
+  EXPECT_EQ(
+      device.run({"report", "sample", "--count", "2", "--interval", "0"}),
+      prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  " + std::string(46, '#') +
+             "  5  entered 5\n\n"
+             "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  ########  "
+             "18446744073709551615  entered 18446744073709551615\n"));
   const auto json = nlohmann::json::parse(
       device.run({"report", "sample", "--delta", "--interval", "0", "--json"}).out);
   EXPECT_EQ(json["channels"][0]["states"], nlohmann::json::parse(R"([{"id": 1, "name": null,
-    "in_transitions": -6, "residency": -6, "duty_cycle": 1.0, "current": false}])"));
+    "in_transitions": -6, "residency": -6, "converted": null, "duty_cycle": 1.0,
+    "current": false}])"));
 }
 
 TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
@@ -219,7 +221,7 @@ TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
             "<id 0x100000201> NAND Traffic Host reads: a value is not set, or their number "
             "changed\n");
   EXPECT_EQ(outcome.out.substr(0, outcome.out.find_last_of(' ')),
-            "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  256 ");
+            "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0");
 }
 
 TEST_F(ReportTest, DescribesInTheSystemsWords) {

@@ -1,13 +1,13 @@
-// The small parts of the tool: values as JSON, days, dates, tables.
+// The small parts of the tool: values as JSON, days, tables.
 #include <cmath>
 #include <gtest/gtest.h>
 #include <limits>
 #include <nlohmann/json.hpp>
 #include <sstream>
 
-#include "tools/shared/base64.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
@@ -66,33 +66,6 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
   EXPECT_NE(cut.error().message.find("line 2, column 5"), std::string::npos) << cut.error().message;
 }
 
-TEST(Base64, RefusesWrongLengthsAndPadding) {
-  for (const std::string_view text :
-       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="}) {
-    EXPECT_FALSE(parseBase64(text)) << text;
-  }
-  for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
-    std::vector<std::byte> bytes(size);
-    for (std::size_t i = 0; i < size; ++i)
-      bytes[i] = static_cast<std::byte>(255 - i);
-    EXPECT_EQ(parseBase64("\n " + base64Text(bytes)), bytes);
-  }
-}
-
-TEST(Dates, AreReadAsTheyAreWritten) {
-  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
-    const auto date = plist::Date::sinceEpoch(seconds);
-    const auto back = parseIsoDate(isoDateText(date));
-    ASSERT_TRUE(back) << back.error().message;
-    EXPECT_EQ(*back, date) << isoDateText(date);
-  }
-  for (const std::string_view text :
-       {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
-        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"}) {
-    EXPECT_FALSE(parseIsoDate(text)) << text;
-  }
-}
-
 TEST(Days, AreNumbersOrDates) {
   const std::tuple<std::string_view, std::int32_t, std::string_view> kCases[] = {
       {"0", 0, "0 (1970-01-01)"},
@@ -139,9 +112,64 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
   table.add({longKey, "1"});
   EXPECT_EQ(print(std::nullopt).substr(0, 55), "  KEY" + std::string(49, ' ') + "N");
   EXPECT_TRUE(print(std::nullopt).ends_with("\n  " + longKey + "    1\n"));
-  EXPECT_EQ(bar(1, 1000000, 40), "#");
-  EXPECT_EQ(bar(20, 40, 40), std::string(20, '#'));
-  EXPECT_EQ(bar(0, 40, 40), "");
+}
+
+TEST(Table, BarsTakeTheColumnsThatAreLeft) {
+  Table table({{"", Table::Align::Whole}, {"", Table::Align::Bar}, {""}});
+  table.add({"a", Table::Cell::bar(10, 10), "x"});
+  table.add({"b", Table::Cell::bar(5, 10), "y"});
+  table.add({"c", Table::Cell::bar(1, 1000), "z"});
+  table.add({"d", Table::Cell::bar(0, 10), ""});
+  const auto print = [&](std::optional<std::size_t> columns) {
+    std::ostringstream out;
+    table.print({out, columns});
+    return out.str();
+  };
+  EXPECT_EQ(print(26),
+            "a  ####################  x\n"
+            "b  ##########            y\n"
+            "c  #                     z\n"
+            "d\n");
+  EXPECT_EQ(print(std::nullopt).find('\n'), 80U);
+  EXPECT_EQ(print(9).find('\n'), 14U);  // at least eight
+}
+
+TEST(Table, MarksWhatStandsOutOnATerminalWithColours) {
+  Table table({{"KEY"}, {"N", Table::Align::Right}});
+  table.add({{"errors", Emphasis::Alarm}, {"7", Emphasis::Alarm}});
+  table.add({"fine", "10"});
+  const auto print = [&](bool isColoured) {
+    std::ostringstream out;
+    table.print({out, 80, isColoured});
+    return out.str();
+  };
+  EXPECT_EQ(print(false), "KEY      N\nerrors   7\nfine    10\n");
+  EXPECT_EQ(print(true),
+            "\x1b[1mKEY\x1b[0m      \x1b[1mN\x1b[0m\n"
+            "\x1b[1;31merrors\x1b[0m   \x1b[1;31m7\x1b[0m\n"
+            "fine    10\n");
+}
+
+TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
+  for (const auto& [value, unit, text] : {std::tuple(41.25, "°C", "41.3 °C"),
+                                          {-0.125, "°C", "-0.125 °C"},
+                                          {0.0, "s", "0 s"},
+                                          {12345e-9, "s", "12.3 µs"},
+                                          {0.25, "s", "250 ms"},
+                                          {119.97, "s", "120 s"},
+                                          {123456.0, "s", "123456 s"},
+                                          {2.4e9, "Hz", "2.4 GHz"},
+                                          {1e-13, "F", "0.1 pF"}}) {
+    EXPECT_EQ(quantityText(value, unit), text);
+  }
+  for (const auto& [bytes, text] : {std::pair(0.0, "0 bytes"),
+                                    {1023.0, "1023 bytes"},
+                                    {1536.0, "1.5 KiB"},
+                                    {1048570.0, "1.0 MiB"},
+                                    {-2048.0, "-2.0 KiB"},
+                                    {0x1p63, "8.0 EiB"}}) {
+    EXPECT_EQ(sizeText(bytes), text);
+  }
 }
 
 TEST(ValueText, ShowsTheKindOfAValue) {

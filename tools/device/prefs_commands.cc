@@ -11,6 +11,7 @@
 #include "platform/plist/xml.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/sorted_entries.h"
 #include "tools/shared/table.h"
 #include "tools/shared/typed_value.h"
 #include "tools/shared/value_text.h"
@@ -132,12 +133,7 @@ void list(ToolContext& context, const Arguments& arguments) {
     return context.printJson({{"domain", arguments.domain}, {"values", jsonOf(values)}});
   }
   Table table({{"KEY"}, {"TYPE"}, {"VALUE"}});
-  std::vector<const plist::Entry*> entries;
-  for (const plist::Entry& entry : values)
-    entries.push_back(&entry);
-  std::sort(entries.begin(), entries.end(),
-            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
-  for (const plist::Entry* entry : entries) {
+  for (const plist::Entry* entry : sortedEntries(values)) {
     table.add({std::string(entry->key.view()), std::string(kindName(entry->value)),
                inlineText(entry->value)});
   }

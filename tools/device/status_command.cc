@@ -110,11 +110,13 @@ std::string storeText(const DeviceStatus& status) {
 void printText(ToolContext& context, const DeviceStatus& status) {
   Table table({{""}, {""}});
   const char* const none = status.isStateReadable ? "none yet" : "unknown";
-  table.add({"Submission", !status.submissionAllowed ? "unknown"
-                           : *status.submissionAllowed
-                               ? "allowed"
-                               : "not allowed (allow it with: tavrelctl prefs set "
-                                 "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)"});
+  table.add({"Submission",
+             !status.submissionAllowed ? Table::Cell("unknown", Emphasis::Alarm)
+             : *status.submissionAllowed
+                 ? Table::Cell("allowed")
+                 : Table::Cell("not allowed (allow it with: tavrelctl prefs set "
+                               "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)",
+                               Emphasis::Alarm)});
   table.add({"Today", dayText(status.today)});
   table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
   table.add({"Last OS version", status.osVersion.value_or(none)});
@@ -123,7 +125,7 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   table.add({"Pending logs", status.pending ? std::to_string(*status.pending) : "unreadable"});
   table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
              status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
-  table.print(context.out(), std::nullopt);
+  table.print({context.out(), std::nullopt, context.page().isColoured});
 }
 
 }  // namespace

@@ -157,8 +157,8 @@ void schedule(ToolContext& context, const std::string& path) {
 
   const plist::Dictionary dictionary = tasking->dictionary();
   context.out() << "Scheduled tasking " << printable(text(dictionary.get(kTaskingIDKey)))
-                << " with " << dictionary.array("TaskingPayload").size()
-                << " settings. The next daily run " << Taskings(context).nextRun() << ".\n";
+                << " with " << counted(dictionary.array("TaskingPayload").size(), "setting")
+                << ". The next daily run " << Taskings(context).nextRun() << ".\n";
 }
 
 void clear(ToolContext& context) {

@@ -9,6 +9,7 @@
 #include "base/arithmetic.h"
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/utf8.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
@@ -18,9 +19,10 @@
 #include "tools/log/log_conclusion.h"
 #include "tools/log/log_document.h"
 #include "tools/log/log_faults.h"
+#include "tools/log/log_list.h"
 #include "tools/overlay/overlay_platform.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/json_value.h"
+#include "tools/shared/input_file.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -33,38 +35,8 @@ struct Arguments {
   bool verbose = false;
 };
 
-std::string textIn(const plist::Dictionary& metadata, std::string_view key) {
-  return std::string(metadata.string(key).value_or("?"));
-}
-
-void list(ToolContext& context) {
-  const auto logs = filedLogs(context);
-  if (!logs) return context.fail(logs.error().message);
-  Table table({{"PLACE"}, {"FILED"}, {"TYPE"}, {"NAME"}, {"BYTES", Table::Align::Right}, {"FILE"}});
-  Json entries = Json::array();
-  for (const FiledLog& log : *logs) {
-    const auto& status = log.status;
-    const auto time = log.metadata.date(kLogMetadataTime);
-    if (context.json()) {
-      Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
-      entry["bytes"] = status ? Json(status->st_size) : Json(nullptr);
-      entries.push_back(std::move(entry));
-    } else {
-      table.add({std::string(nameOf(log.place)), time ? isoDateText(*time) : "?",
-                 textIn(log.metadata, kLogMetadataType), textIn(log.metadata, kLogMetadataName),
-                 status ? std::to_string(status->st_size) : "?", fileNameOf(log)});
-    }
-  }
-  if (context.json()) {
-    context.printJson({{"logs", std::move(entries)}});
-  } else if (!table.empty()) {
-    table.print(context.out(), context.columns());
-  }
-  noteMissingMetadata(context, *logs);
-}
-
-/// The log that `name` means: "latest" (of the daily logs), the name of a filed log, or a path of
-/// this machine.
+/// The log that `name` means: "latest" (of the daily logs), the name of a filed log or its
+/// beginning, or a path of this machine.
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   std::optional<FiledLog> found;
   if (name == "latest") {
@@ -80,7 +52,7 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   } else {
     found = filedLogNamed(context, name);
   }
-  if (!found) return LogEnvelope{"file", name, {}};
+  if (!found) return logBeginning(context, name);
   return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
 }
 
@@ -91,7 +63,7 @@ void showText(ToolContext& context, const LogEnvelope& envelope, std::string_vie
     log["text"] = bytes;
     return context.printJson({{"log", std::move(log)}});
   }
-  printEnvelope(context.out(), envelope);
+  printEnvelope(context.page(), envelope);
   context.out() << '\n';
   while (!bytes.empty()) {
     const std::size_t end = std::min(bytes.find('\n'), bytes.size());
@@ -103,15 +75,15 @@ void showText(ToolContext& context, const LogEnvelope& envelope, std::string_vie
 void showDocument(ToolContext& context, const LogEnvelope& envelope,
                   const plist::Dictionary& document) {
   if (context.json()) return context.printJson({{"log", jsonOfLog(envelope, document)}});
-  printLog(context.out(), envelope, document, context.columns());
+  printLog(context.page(), envelope, document);
 }
 
 void show(ToolContext& context, const Arguments& arguments) {
-  const auto envelope = findLog(context, arguments.file);
+  auto envelope = findLog(context, arguments.file);
   if (!envelope) return context.fail(envelope.error().message);
-  const auto bytes =
-      context.linuxPlatform().fileSystem().read(envelope->path, limits::kPropertyListBytes);
+  const auto bytes = readInput(context, envelope->path, limits::kPropertyListBytes);
   if (!bytes) return context.fail(bytes.error().message);
+  if (envelope->path == "-") envelope->path = "standard input";
   if (arguments.raw) {
     context.out() << *bytes;
     return;
@@ -122,6 +94,12 @@ void show(ToolContext& context, const Arguments& arguments) {
         format("not a tallied log: %s: 'tavrelctl plist show FILE' shows it", envelope->path));
   }
   if (value) return showDocument(context, *envelope, value->dictionary());
+  if (bytes->find('\0') != std::string::npos || !isValidUtf8(*bytes)) {
+    return context.fail(
+        format("not a log: %s: it is neither a property list nor text: 'tavrelctl log list' shows "
+               "the logs",
+               envelope->path));
+  }
   showText(context, *envelope, *bytes);
 }
 
@@ -196,12 +174,13 @@ void addLogCommands(Command app, ToolContext& context) {
 
   const Command listCommand = group.addCommand("list", "List the logs that were submitted");
   context.addJsonOption(listCommand);
-  listCommand.onRun([&context] { list(context); });
+  listCommand.onRun([&context] { listLogs(context); });
 
   const Command showCommand = group.addCommand("show", "Show a submitted log");
   showCommand
       .addOption("FILE", arguments->file,
-                 "A log of 'log list', a path, or latest, the last daily one")
+                 "A log of 'log list' or the beginning of its name, a path, - for standard input, "
+                 "or latest, the last daily one")
       .showDefault();
   const Option raw =
       showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes as they are");

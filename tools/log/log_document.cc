@@ -1,25 +1,28 @@
 #include "tools/log/log_document.h"
 
-#include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
+#include "base/civil_time.h"
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/text.h"
 #include "platform/linux/logs/file_submission.h"
 #include "tools/log/log_faults.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
+#include "tools/shared/error_figures.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/sorted_entries.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {
 
-void printField(std::ostream& out, std::string_view name, std::string_view text) {
-  out << format("%-12s  ", name) << printable(text) << '\n';
+void printField(const Page& page, std::string_view name, std::string_view text) {
+  page.out << format("%-12s  ", name) << printable(text) << '\n';
 }
 
 // A value of the header: texts plain, other values so that they show their kind.
@@ -28,8 +31,8 @@ std::string fieldText(const plist::Value& value) {
   return inlineText(value);
 }
 
-void printFieldOf(std::ostream& out, std::string_view name, const plist::Value& value) {
-  if (value) printField(out, name, fieldText(value));
+void printFieldOf(const Page& page, std::string_view name, const plist::Value& value) {
+  if (value) printField(page, name, fieldText(value));
 }
 
 Json jsonField(const plist::Value& value) {
@@ -37,40 +40,54 @@ Json jsonField(const plist::Value& value) {
   return jsonOf(value);
 }
 
-std::optional<std::int32_t> dayOf(const plist::Dictionary& log) {
-  const auto start = log.date("BHStartDate");
-  if (!start) return std::nullopt;
-  const double day = std::floor(start->secondsSince1970() / 86400.0);
-  if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
-  return static_cast<std::int32_t>(day);
+void printTitle(const Page& page, std::string_view title, std::size_t count) {
+  page.out << '\n' << page.styled(format("%s (%zu)", title, count), Emphasis::Strong) << '\n';
 }
 
-void printValues(std::ostream& out, std::string_view title, const plist::Dictionary& values,
-                 Table::Align align, std::optional<std::size_t> columns) {
-  if (values.empty()) return;
-  out << format("\n%s (%zu)\n", title, values.size());
-  std::vector<const plist::Entry*> entries;
-  for (const plist::Entry& entry : values)
-    entries.push_back(&entry);
-  std::sort(entries.begin(), entries.end(),
-            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
-  Table table({{""}, {"", align}}, 2);
-  for (const plist::Entry* entry : entries) {
-    table.add({std::string(entry->key.view()), fieldText(entry->value)});
+// Pairs of keys whose first tells how much of the second is free.
+constexpr std::pair<std::string_view, std::string_view> kDisks[] = {
+    {"com.norvane.lumenhall.DiskUsageUserBlocksFree",
+     "com.norvane.lumenhall.DiskUsageUserTotalBlocks"},
+    {"com.norvane.usage.disk.free_mib", "com.norvane.usage.disk.total_mib"},
+};
+
+// Less free than this part of a disk is worth a look.
+constexpr double kShortShare = 0.1;
+
+Emphasis emphasisOf(const plist::Entry& entry, const plist::Dictionary& values) {
+  const auto number = entry.value.number();
+  if (!number) return Emphasis::None;
+  if (isErrorFigure(entry.key) && number->real() != 0) return Emphasis::Alarm;
+  for (const auto& [free, total] : kDisks) {
+    const auto all = values.number(total);
+    if (entry.key == free && all && number->real() < kShortShare * all->real()) {
+      return Emphasis::Alarm;
+    }
   }
-  table.print(out, columns);
+  return Emphasis::None;
 }
 
-void printHistogram(std::ostream& out, const DistributionView& view,
-                    std::optional<std::size_t> columns) {
-  out << format("\nHistogram of %s\n", printable(view.key));
-  printBuckets(out, view.buckets, columns);
+void printValues(const Page& page, std::string_view title, const plist::Dictionary& values,
+                 Table::Align align) {
+  if (values.empty()) return;
+  printTitle(page, title, values.size());
+  Table table({{""}, {"", align}}, 2);
+  for (const plist::Entry* entry : sortedEntries(values)) {
+    const Emphasis emphasis = emphasisOf(*entry, values);
+    table.add({{std::string(entry->key.view()), emphasis}, {fieldText(entry->value), emphasis}});
+  }
+  table.print(page);
 }
 
-void printDistributions(std::ostream& out, const std::vector<DistributionView>& views,
-                        std::optional<std::size_t> columns) {
+void printHistogram(const Page& page, const DistributionView& view) {
+  const std::string title = format("Histogram of %s", printable(view.key));
+  page.out << '\n' << page.styled(title, Emphasis::Strong) << '\n';
+  printBuckets(page, view.buckets);
+}
+
+void printDistributions(const Page& page, const std::vector<DistributionView>& views) {
   if (views.empty()) return;
-  out << format("\nDistributions (%zu)\n", views.size());
+  printTitle(page, "Distributions", views.size());
   constexpr auto kRight = Table::Align::Right;
   Table table({{"KEY"},
                {"COUNT", kRight},
@@ -85,9 +102,9 @@ void printDistributions(std::ostream& out, const std::vector<DistributionView>& 
                shortNumber(view.maximum), shortNumber(view.mean),
                deviation ? shortNumber(*deviation) : "-"});
   }
-  table.print(out, columns);
+  table.print(page);
   for (const DistributionView& view : views) {
-    if (!view.buckets.empty()) printHistogram(out, view, columns);
+    if (!view.buckets.empty()) printHistogram(page, view);
   }
 }
 
@@ -116,16 +133,24 @@ Json jsonOfDistributions(const std::vector<DistributionView>& views) {
 
 }  // namespace
 
-void printEnvelope(std::ostream& out, const LogEnvelope& envelope) {
+std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log) {
+  const auto start = log.date("BHStartDate");
+  if (!start) return std::nullopt;
+  const double day = std::floor(start->secondsSince1970() / static_cast<double>(kSecondsPerDay));
+  if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
+  return static_cast<std::int32_t>(day);
+}
+
+void printEnvelope(const Page& page, const LogEnvelope& envelope) {
   printField(
-      out, "Log",
+      page, "Log",
       envelope.path.empty() ? envelope.place : format("%s (%s)", envelope.path, envelope.place));
   const plist::Dictionary& metadata = envelope.metadata;
-  printFieldOf(out, "Type", metadata.get(kLogMetadataType));
-  printFieldOf(out, "Name", metadata.get(kLogMetadataName));
-  printFieldOf(out, "Filed", metadata.get(kLogMetadataTime));
-  printFieldOf(out, "OS version", metadata.get(kLogMetadataVersion));
-  printFieldOf(out, "Options", metadata.get(kLogMetadataOptions));
+  printFieldOf(page, "Type", metadata.get(kLogMetadataType));
+  printFieldOf(page, "Name", metadata.get(kLogMetadataName));
+  printFieldOf(page, "Filed", metadata.get(kLogMetadataTime));
+  printFieldOf(page, "OS version", metadata.get(kLogMetadataVersion));
+  printFieldOf(page, "Options", metadata.get(kLogMetadataOptions));
 }
 
 Json jsonOfEnvelope(const LogEnvelope& envelope) {
@@ -143,31 +168,30 @@ Json jsonOfEnvelope(const LogEnvelope& envelope) {
   return object;
 }
 
-void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dictionary& document,
-              std::optional<std::size_t> columns) {
-  printEnvelope(out, envelope);
-  if (const auto day = dayOf(document)) {
-    printField(out, "Day", dayText(*day));
+void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictionary& document) {
+  printEnvelope(page, envelope);
+  if (const auto day = dayOfLog(document)) {
+    printField(page, "Day", dayText(*day));
   } else {
-    printFieldOf(out, "Day", document.get("BHStartDate"));
+    printFieldOf(page, "Day", document.get("BHStartDate"));
   }
-  printFieldOf(out, "Created", document.get("BHLogCreationDate"));
-  printFieldOf(out, "Version", document.get("BHCrashLogVersion"));
-  printFieldOf(out, "Whitelist", document.get("BHWhitelistDigest"));
-  printFieldOf(out, "Tasking", document.get("BHTaskID"));
-  printFieldOf(out, "Task digest", document.get("BHTaskDigest"));
+  printFieldOf(page, "Created", document.get("BHLogCreationDate"));
+  printFieldOf(page, "Version", document.get("BHCrashLogVersion"));
+  printFieldOf(page, "Whitelist", document.get("BHWhitelistDigest"));
+  printFieldOf(page, "Tasking", document.get("BHTaskID"));
+  printFieldOf(page, "Task digest", document.get("BHTaskDigest"));
   if (const plist::Array tasking = document.array("BHTasking")) {
-    printField(out, "Settings", std::to_string(tasking.size()));
+    printField(page, "Settings", std::to_string(tasking.size()));
   }
 
-  printValues(out, "Metadata", document.dictionary("BHMetadata"), Table::Align::Left, columns);
-  printValues(out, "Scalars", document.dictionary("BHScalars"), Table::Align::Right, columns);
-  printDistributions(out, distributionsOf(document), columns);
+  printValues(page, "Metadata", document.dictionary("BHMetadata"), Table::Align::Left);
+  printValues(page, "Scalars", document.dictionary("BHScalars"), Table::Align::Right);
+  printDistributions(page, distributionsOf(document));
 
   if (const auto faults = faultsOf(document); !faults.empty()) {
-    out << format("\nNot as a tallied log has it (%zu)\n", faults.size());
+    printTitle(page, "Not as a tallied log has it", faults.size());
     for (const std::string& fault : faults)
-      out << "  " << printable(fault) << '\n';
+      page.out << "  " << printable(fault) << '\n';
   }
 
   for (const auto& [title, key] : {std::pair("Tasking settings", "BHTasking"),
@@ -175,16 +199,16 @@ void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dicti
     const plist::Array list = document.array(key);
     if (!list) continue;
     if (list.empty() && key == std::string_view("BHTasking")) continue;
-    out << format("\n%s (%zu)\n", title, list.size());
+    printTitle(page, title, list.size());
     for (const plist::Value& element : list) {
-      out << "  " << printable(inlineText(element)) << '\n';
+      page.out << "  " << printable(inlineText(element)) << '\n';
     }
   }
 }
 
 Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document) {
   Json log = jsonOfEnvelope(envelope);
-  if (const auto day = dayOf(document)) {
+  if (const auto day = dayOfLog(document)) {
     log["day"] = *day;
     log["date"] = dayDateText(*day);
   }

@@ -1,8 +1,7 @@
 // Shows a tallied log to people and programs.
 #pragma once
 
-#include <cstddef>
-#include <iosfwd>
+#include <cstdint>
 #include <optional>
 #include <string>
 #include <utility>
@@ -20,17 +19,19 @@ struct LogEnvelope {
   plist::Dictionary metadata;
 };
 
-/// The table form: header, metadata, scalars, distributions, histograms as bars, and faults.
-/// `document` is the log when it is a property list.
-void printLog(std::ostream& out, const LogEnvelope& envelope, const plist::Dictionary& document,
-              std::optional<std::size_t> columns);
+/// The day that a log reports.
+std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log);
+
+/// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
+/// a tallied log has it. `document` is the log when it is a property list.
+void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictionary& document);
 
 /// The same facts. The standard deviation is that of the population: the root of the sum of squared
 /// deviations divided by the count.
 Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document);
 
-/// The lines of a log's envelope, which also precede logs of other forms.
-void printEnvelope(std::ostream& out, const LogEnvelope& envelope);
+/// The lines of a log's envelope, which also stand before logs of other forms.
+void printEnvelope(const Page& page, const LogEnvelope& envelope);
 Json jsonOfEnvelope(const LogEnvelope& envelope);
 
 }  // namespace tavrel

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/files/file_system.h"
@@ -15,6 +16,7 @@
 #include "storage/parse/nand_log_writer.h"
 #include "tools/log/filed_logs.h"
 #include "tools/log/log_document.h"
+#include "tools/shared/error_figures.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
 
@@ -167,7 +169,8 @@ void printField(std::ostream& out, std::string_view name, std::string_view text)
 }
 
 void print(ToolContext& context, const LogEnvelope& envelope, const NandLog& log) {
-  std::ostream& out = context.out();
+  const Page page = context.page();
+  std::ostream& out = page.out;
   printField(out, "Log", format("%s (%s)", envelope.path, envelope.place));
   for (const auto& [name, value] : log.header)
     printField(out, name, value);
@@ -178,21 +181,28 @@ void print(ToolContext& context, const LogEnvelope& envelope, const NandLog& log
     std::size_t count = 0;
     for (const auto& [key, value] : log.items) {
       if (!isInGroup(group, key)) continue;
-      table.add({key, value});
+      const bool isAlarming = isErrorFigure(key) && value != "0";
+      const Emphasis emphasis = isAlarming ? Emphasis::Alarm : Emphasis::None;
+      table.add({{key, emphasis}, {value, emphasis}});
       ++count;
     }
     if (count == 0) continue;
-    out << format("\n%s (%zu)\n", group.title, count);
-    table.print(out, context.columns());
+    const std::string title = format("%s (%zu)", group.title, count);
+    out << '\n' << page.styled(title, Emphasis::Strong) << '\n';
+    table.print(page);
   }
   out << '\n';
 }
 
+// Without metadata, as where it may not be read, the name of the file tells.
+bool isNandLog(const FiledLog& log) {
+  if (log.metadata.empty()) return log.name.starts_with(kNandLogName);
+  return log.metadata.string(kLogMetadataName) == kNandLogName &&
+         log.metadata.string(kLogMetadataType) == kNandLogType;
+}
+
 void show(ToolContext& context) {
-  const auto found = newestLog(context, kNandLogName, [](const FiledLog& log) {
-    return log.metadata.string(kLogMetadataName) == kNandLogName &&
-           log.metadata.string(kLogMetadataType) == kNandLogType;
-  });
+  const auto found = newestLog(context, kNandLogName, isNandLog);
   if (!found) return context.fail(found.error().message);
   const std::optional<FiledLog>& newest = *found;
   const NextLog next = nextLog(context);

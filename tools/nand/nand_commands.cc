@@ -14,9 +14,11 @@
 #include "storage/nand_info.h"
 #include "storage/nand_info_keys.h"
 #include "storage/parse/asp_parser.h"
+#include "storage/parse/snapshot_record.h"
 #include "storage/vm_freezer.h"
 #include "tools/nand/nand_build.h"
 #include "tools/nand/nand_counters.h"
+#include "tools/nand/nand_derived.h"
 #include "tools/nand/nand_snapshot.h"
 #include "tools/nand/nand_statistics.h"
 #include "tools/nand/nand_view.h"
@@ -24,6 +26,7 @@
 #include "tools/shared/json_value.h"
 #include "tools/shared/noting_platform.h"
 #include "tools/shared/output_file.h"
+#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
@@ -34,24 +37,34 @@ struct Arguments {
   std::string chipId;
   std::string manufacturerId;
   std::string output;
+  bool all = false;
 };
 
 std::string nameOf(const std::string& file) {
   return file == "-" ? "standard input" : file;
 }
 
+// Whether both files are standard input, which can be read only once. Says so.
+bool namesInputTwice(ToolContext& context, const Arguments& arguments) {
+  if (arguments.file != "-" || arguments.other != "-") return false;
+  context.failUsage("standard input can be read once: give - for one of the files");
+  return true;
+}
+
 Expected<std::string> readBuffer(ToolContext& context, const std::string& file) {
   return readInput(context, file, limits::kDeviceAllocationBytes);
 }
 
-void info(ToolContext& context) {
+void info(ToolContext& context, const Arguments& arguments) {
   NotingPlatform noting(context);
   const plist::Dictionary info = CopyNANDInfo(noting.platform());
   const bool failed = info.contains(kNANDInfoErrorKey);
   if (context.json()) {
-    context.printJson(jsonOf(info));
+    Json document = jsonOf(info);
+    if (!failed) document["derived"] = jsonOf(NandDerived(info));
+    context.printJson(std::move(document));
   } else if (!failed) {
-    printNandInfo(context.out(), info, context.columns());
+    printNandInfo(context.page(), info, arguments.all);
   }
   if (!failed) return;
   const NandExporter* exporter = nullptr;
@@ -85,11 +98,18 @@ void parse(ToolContext& context, const Arguments& arguments) {
   if (!bytes) return context.fail(bytes.error().message);
   ASPContext statistics;
   const int result = parseInto(context, arguments.file, *bytes, statistics);
-  if (context.json()) return context.printJson(jsonOfStatistics(result, statistics));
-  printStatistics(context.out(), statistics, context.columns());
+  const ByteSpan buffer = asBytes(*bytes);
+  if (context.json()) return printStatisticsJson(context.out(), result, statistics, buffer);
+  if (const auto unlisted = printStatistics(context.page(), statistics, buffer); unlisted > 0) {
+    context.note(
+        format("%s: %s not listed: of unknown statistics, without values or with too many: "
+               "--json prints them whole",
+               nameOf(arguments.file), counted(unlisted, "record")));
+  }
 }
 
 void compare(ToolContext& context, const Arguments& arguments) {
+  if (namesInputTwice(context, arguments)) return;
   const auto first = readBuffer(context, arguments.file);
   if (!first) return context.fail(first.error().message);
   const auto second = readBuffer(context, arguments.other);
@@ -102,7 +122,7 @@ void compare(ToolContext& context, const Arguments& arguments) {
     return context.printJson({{"results", {firstResult, secondResult}},
                               {"differences", jsonOfDifferences(differences)}});
   }
-  printDifferences(context.out(), differences, context.columns());
+  printDifferences(context.page(), differences);
 }
 
 void counters(ToolContext& context, const Arguments& arguments) {
@@ -122,14 +142,21 @@ void counters(ToolContext& context, const Arguments& arguments) {
   parser(asBytes(*bytes).first<kCounterBlockBytes>(), record);
   const std::string_view name = counterParserName(parser);
   if (context.json()) return context.printJson(jsonOfCounters(name, record));
-  printCounters(context.out(), name, record, context.columns());
+  printCounters(context.page(), name, record);
 }
 
 void snapshot(ToolContext& context, const Arguments& arguments) {
+  if (namesInputTwice(context, arguments)) return;
   const auto records = readBuffer(context, arguments.file);
   if (!records) return context.fail(records.error().message);
   std::string descriptor;
   const bool hasDescriptor = !arguments.other.empty();
+  if (!hasDescriptor && records->size() < kSnapshotRecordBytes) {
+    return context.fail(format(
+        "%s holds no whole record: it has %zu bytes, and a record has %zu: give a timeline of the "
+        "controller, and --descriptor if one came with it",
+        nameOf(arguments.file), records->size(), kSnapshotRecordBytes));
+  }
   if (hasDescriptor) {
     auto bytes = readBuffer(context, arguments.other);
     if (!bytes) return context.fail(bytes.error().message);
@@ -141,6 +168,11 @@ void snapshot(ToolContext& context, const Arguments& arguments) {
     return context.fail(format("cannot render %s: %s",
                                nameOf(hasDescriptor ? arguments.other : arguments.file),
                                text.error().message));
+  }
+  if (const std::size_t surplus = records->size() % kSnapshotRecordBytes;
+      !hasDescriptor && surplus > 0) {
+    context.note(format("%s: the last %zu bytes are no whole record of %zu and were passed over",
+                        nameOf(arguments.file), surplus, kSnapshotRecordBytes));
   }
   context.out() << *text;
 }
@@ -160,7 +192,7 @@ void freezer(ToolContext& context, const Arguments& arguments) {
   if (context.json()) {
     context.printJson(jsonOf(info));
   } else if (!failed) {
-    printNandInfo(context.out(), info, context.columns());
+    printNandInfo(context.page(), info, true);
   }
   if (!failed) return;
   std::string message(info.string(kNANDInfoVMFreezerErrorMessageKey).value_or(""));
@@ -198,8 +230,9 @@ void addNandCommands(Command app, ToolContext& context) {
   };
 
   const Command infoCommand = group.addCommand("info", "Show the health of the flash");
+  infoCommand.addFlag("--all", arguments->all, "Show the figures that are 0 too");
   context.addJsonOption(infoCommand);
-  infoCommand.onRun([&context] { info(context); });
+  infoCommand.onRun([&context, arguments] { info(context, *arguments); });
 
   const Command parseCommand = group.addCommand("parse", "Show every statistic of a raw buffer");
   addFile(parseCommand, "Statistics buffer; - is standard input").required();

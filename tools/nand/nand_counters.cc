@@ -16,24 +16,23 @@ namespace {
 
 constexpr std::size_t kPerRow = 8;
 
-void printBins(std::ostream& out, std::span<const std::uint32_t> counters,
-               std::optional<std::size_t> columns) {
+void printBins(const Page& page, std::span<const std::uint32_t> counters) {
   std::vector<DistributionView::Bucket> bars;
   for (const std::uint32_t counter : counters)
     bars.push_back({std::to_string(bars.size()), counter});
-  printBuckets(out, bars, columns);
+  printBuckets(page, bars);
 }
 
 // The number before a row is that of its first element.
-void printRows(std::ostream& out, std::span<const std::uint32_t> counters) {
+void printRows(const Page& page, std::span<const std::uint32_t> counters) {
   Table table(std::vector<Table::Column>(1 + kPerRow, {"", Table::Align::Right}), 2);
   for (std::size_t first = 0; first < counters.size(); first += kPerRow) {
-    std::vector<std::string> row{format("%zu:", first)};
+    std::vector<Table::Cell> row{format("%zu:", first)};
     for (std::size_t i = first; i < std::min(first + kPerRow, counters.size()); ++i)
-      row.push_back(std::to_string(counters[i]));
+      row.emplace_back(std::to_string(counters[i]));
     table.add(std::move(row));
   }
-  table.print(out, std::nullopt);
+  table.print(page);
 }
 
 }  // namespace
@@ -45,18 +44,18 @@ Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters) 
   return {{"parser", parser}, {"counters", std::move(arrays)}};
 }
 
-void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
-                   std::optional<std::size_t> columns) {
-  out << "Parser  " << parser << '\n';
+void printCounters(const Page& page, std::string_view parser, const TelemetryCounters& counters) {
+  page.out << "Parser  " << parser << '\n';
   for (const CounterArrayShape& shape : kCounterArrays) {
     const auto array = counters[shape.array];
     const bool isEmpty = std::all_of(array.begin(), array.end(), [](auto c) { return c == 0; });
-    out << format("\n%s (%zu)%s\n", shape.name, shape.size, isEmpty ? ": all 0" : "");
+    page.out << format("\n%s (%zu)%s\n", page.styled(shape.name, Emphasis::Strong), shape.size,
+                       isEmpty ? ": all 0" : "");
     if (isEmpty) continue;
     if (shape.name.ends_with("Bin")) {
-      printBins(out, array, columns);
+      printBins(page, array);
     } else {
-      printRows(out, array);
+      printRows(page, array);
     }
   }
 }

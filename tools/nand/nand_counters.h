@@ -13,8 +13,7 @@ namespace tavrel {
 /// {"parser": …, "counters": {"readStage": […], …}}
 Json jsonOfCounters(std::string_view parser, const TelemetryCounters& counters);
 
-/// Error bins as bars, other arrays in rows of eight, arrays of zeros on one line.
-void printCounters(std::ostream& out, std::string_view parser, const TelemetryCounters& counters,
-                   std::optional<std::size_t> columns);
+/// Error bins as bars, the other arrays in rows of eight; arrays of zeros on one line.
+void printCounters(const Page& page, std::string_view parser, const TelemetryCounters& counters);
 
 }  // namespace tavrel

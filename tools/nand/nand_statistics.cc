@@ -6,6 +6,9 @@
 #include <utility>
 
 #include "base/format.h"
+#include "base/text.h"
+#include "storage/parse/statistic_keys.h"
+#include "tools/shared/json_list.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -13,6 +16,58 @@ namespace {
 
 constexpr std::uint64_t kUnitBytes = 8;
 constexpr std::uint32_t kLargestValidKey = 0x30000000;
+
+struct Record {
+  std::uint32_t key;
+  ByteSpan values;  // whole units
+  const StatisticKey* statistic;
+
+  std::size_t count() const { return values.size() / kUnitBytes; }
+  std::uint64_t value(std::size_t i) const { return *loadLittle64(values, i * kUnitBytes); }
+  /// Whether the parser lists all of it: under its name, one value an entry.
+  bool isListed() const { return statistic && count() > 0 && count() <= statistic->cap; }
+};
+
+// Walks the records up to the first that is broken. Says why it is.
+template <class Visit>
+std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
+  const std::uint64_t end = buffer.size() / kUnitBytes * kUnitBytes;
+  if (end == 0) return format("it has %zu bytes, and a record has at least 8", buffer.size());
+  for (std::uint64_t at = 0; at < end;) {
+    const std::uint32_t key = *loadLittle32(buffer, at), count = *loadLittle32(buffer, at + 4);
+    if (key > kLargestValidKey) {
+      return format(
+          "the record at byte %llu: 0x%x is above 0x30000000, the largest number of a "
+          "statistic",
+          at, key);
+    }
+    at += kUnitBytes;
+    const std::uint64_t left = (end - at) / kUnitBytes;
+    if (count > left) {
+      return format("the record at byte %llu: statistic %u has %s, but there is room for %llu",
+                    at - kUnitBytes, key, counted(count, "value"), left);
+    }
+    visit(Record{key, *slice(buffer, at, count * kUnitBytes), findStatisticKey(key)});
+    at += count * kUnitBytes;
+  }
+  return std::nullopt;
+}
+
+// As `nand build` reads them. What is not listed is a record of its own, so that nothing is lost.
+void addEntries(JsonList& entries, const Record& record) {
+  if (!record.isListed()) {
+    Json values = Json::array();
+    for (std::size_t i = 0; i < record.count(); ++i)
+      values.push_back(record.value(i));
+    entries.add({{"key", record.statistic ? Json(record.statistic->name) : Json(record.key)},
+                 {"values", std::move(values)}});
+    return;
+  }
+  const std::string name(record.statistic->name);
+  if (record.count() == 1) return entries.add(Json::array({name, record.value(0)}));
+  for (std::size_t i = 0; i < record.count(); ++i)
+    entries.add(Json::array({name + std::to_string(i), record.value(i)}));
+}
 
 struct Row {
   std::string_view name;
@@ -55,64 +110,58 @@ std::string valueText(const std::optional<std::uint64_t>& value) {
 
 }  // namespace
 
-Json jsonOfStatistics(int result, const ASPContext& context) {
-  Json entries = Json::array();
-  forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
-    entries.push_back(Json::array({name, entry.value}));
-  });
-  return {{"result", result},
-          {"fields",
-           {{"exportVersion", context.exportVersion},
-            {"driverVersion", context.driverVersion},
-            {"numVirtualBlocks", context.numVirtualBlocks},
-            {"blocksPerVirtualBlock", context.blocksPerVirtualBlock},
-            {"pagesPerVirtualBlock", context.pagesPerVirtualBlock},
-            {"bytesPerPage", context.bytesPerPage},
-            {"hostReads", context.hostReads},
-            {"hostWrites", context.hostWrites},
-            {"numFreeVirtualBlocks", context.numFreeVirtualBlocks},
-            {"wearLevMoves", context.wearLevMoves},
-            {"nandReads", context.nandReads},
-            {"nandWrites", context.nandWrites},
-            {"bandErases", context.bandErases},
-            {"IND_pool_free", context.IND_pool_free},
-            {"IND_pool_count", context.IND_pool_count},
-            {"utilFormatTime", context.utilFormatTime},
-            {"numSleepOps", context.numSleepOps},
-            {"maxHighEnduranceBlockErases", context.maxHighEnduranceBlockErases},
-            {"readCountHisto", context.readCountHisto}}},
-          {"entries", std::move(entries)}};
+void printStatisticsJson(std::ostream& out, int result, const ASPContext& context,
+                         ByteSpan buffer) {
+  JsonList entries(out,
+                   {{"result", result},
+                    {"fields",
+                     {{"exportVersion", context.exportVersion},
+                      {"driverVersion", context.driverVersion},
+                      {"numVirtualBlocks", context.numVirtualBlocks},
+                      {"blocksPerVirtualBlock", context.blocksPerVirtualBlock},
+                      {"pagesPerVirtualBlock", context.pagesPerVirtualBlock},
+                      {"bytesPerPage", context.bytesPerPage},
+                      {"hostReads", context.hostReads},
+                      {"hostWrites", context.hostWrites},
+                      {"numFreeVirtualBlocks", context.numFreeVirtualBlocks},
+                      {"wearLevMoves", context.wearLevMoves},
+                      {"nandReads", context.nandReads},
+                      {"nandWrites", context.nandWrites},
+                      {"bandErases", context.bandErases},
+                      {"IND_pool_free", context.IND_pool_free},
+                      {"IND_pool_count", context.IND_pool_count},
+                      {"utilFormatTime", context.utilFormatTime},
+                      {"numSleepOps", context.numSleepOps},
+                      {"maxHighEnduranceBlockErases", context.maxHighEnduranceBlockErases},
+                      {"readCountHisto", context.readCountHisto}}}},
+                   "entries");
+  forEachRecord(buffer, [&](const Record& record) { addEntries(entries, record); });
+  if (const ByteSpan rest = buffer.subspan(buffer.size() / kUnitBytes * kUnitBytes);
+      result == 1 && !rest.empty()) {
+    std::string hex;
+    appendHex(hex, rest);
+    entries.add({{"hex", std::move(hex)}});
+  }
+  entries.end();
 }
 
-void printStatistics(std::ostream& out, const ASPContext& context,
-                     std::optional<std::size_t> columns) {
-  Table table({{"STATISTIC"}, {"VALUE", Table::Align::Right}});
+std::size_t printStatistics(const Page& page, const ASPContext& context, ByteSpan buffer) {
+  Table table({{"STATISTIC", Table::Align::Whole}, {"VALUE", Table::Align::Right}});
   forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
     table.add({std::string(name), std::string(asText(entry.text))});
   });
-  if (!table.empty()) table.print(out, columns);
+  if (table.empty()) {
+    page.out << "no statistics that have a name\n";
+  } else {
+    table.print(page);
+  }
+  std::size_t unlisted = 0;
+  forEachRecord(buffer, [&](const Record& record) { unlisted += record.isListed() ? 0U : 1U; });
+  return unlisted;
 }
 
 std::optional<std::string> faultOfStatistics(ByteSpan buffer) {
-  const std::uint64_t end = buffer.size() / kUnitBytes * kUnitBytes;
-  if (end == 0) return format("it has %zu bytes, and a record has at least 8", buffer.size());
-  for (std::uint64_t at = 0; at < end;) {
-    const std::uint32_t key = *loadLittle32(buffer, at), count = *loadLittle32(buffer, at + 4);
-    if (key > kLargestValidKey) {
-      return format(
-          "the record at byte %llu: 0x%x is above 0x30000000, the largest number of a "
-          "statistic",
-          at, key);
-    }
-    at += kUnitBytes;
-    const std::uint64_t left = (end - at) / kUnitBytes;
-    if (count > left) {
-      return format("the record at byte %llu: statistic %u has %s, but there is room for %llu",
-                    at - kUnitBytes, key, counted(count, "value"), left);
-    }
-    at += count * kUnitBytes;
-  }
-  return std::nullopt;
+  return forEachRecord(buffer, [](const Record&) {});
 }
 
 std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
@@ -152,15 +201,21 @@ Json jsonOfDifferences(const std::vector<StatisticDifference>& differences) {
   return list;
 }
 
-void printDifferences(std::ostream& out, const std::vector<StatisticDifference>& differences,
-                      std::optional<std::size_t> columns) {
+void printDifferences(const Page& page, const std::vector<StatisticDifference>& differences) {
   constexpr auto kRight = Table::Align::Right;
-  Table table({{"STATISTIC"}, {"BEFORE", kRight}, {"AFTER", kRight}, {"CHANGE", kRight}});
+  Table table({{"STATISTIC", Table::Align::Whole},
+               {"BEFORE", kRight},
+               {"AFTER", kRight},
+               {"CHANGE", kRight}});
   for (const StatisticDifference& difference : differences) {
     table.add({std::string(difference.name), valueText(difference.before),
                valueText(difference.after), changeText(difference)});
   }
-  if (!table.empty()) table.print(out, columns);
+  if (table.empty()) {
+    page.out << "no differences among the statistics that have a name\n";
+  } else {
+    table.print(page);
+  }
 }
 
 }  // namespace tavrel

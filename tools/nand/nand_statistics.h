@@ -14,12 +14,13 @@
 
 namespace tavrel {
 
-/// {"result": …, "fields": {…}, "entries": [[name, value], …]}
-Json jsonOfStatistics(int result, const ASPContext& context);
+/// {"result": …, "fields": {…}, "entries": [[name, value], …]}, with every record of the buffer up
+/// to the first that is broken: `nand build` makes the same bytes of it.
+void printStatisticsJson(std::ostream& out, int result, const ASPContext& context, ByteSpan buffer);
 
-/// One line per statistic, in the order of the buffer.
-void printStatistics(std::ostream& out, const ASPContext& context,
-                     std::optional<std::size_t> columns);
+/// One line a statistic, in the order of the buffer. Answers how many records are not listed, or
+/// not wholly: those of unknown statistics, without values, or with too many.
+std::size_t printStatistics(const Page& page, const ASPContext& context, ByteSpan buffer);
 
 /// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for a good buffer.
 std::optional<std::string> faultOfStatistics(ByteSpan buffer);
@@ -41,7 +42,6 @@ std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
 /// than 63 bits, are null.
 Json jsonOfDifferences(const std::vector<StatisticDifference>& differences);
 
-void printDifferences(std::ostream& out, const std::vector<StatisticDifference>& differences,
-                      std::optional<std::size_t> columns);
+void printDifferences(const Page& page, const std::vector<StatisticDifference>& differences);
 
 }  // namespace tavrel

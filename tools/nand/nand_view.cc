@@ -13,18 +13,18 @@
 #include "base/civil_time.h"
 #include "base/format.h"
 #include "storage/nand_info_keys.h"
+#include "tools/nand/nand_derived.h"
 #include "tools/shared/distribution_view.h"
+#include "tools/shared/error_figures.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {
 
-// So many keys that differ only in a number at their end make a histogram.
-constexpr std::size_t kFewestBuckets = 3;
-
-constexpr std::uint64_t kSectorBytes = 4096;  // of logical traffic
-constexpr std::int64_t kDaysTo2000 = 10957;   // since 1970
+// Less of the flash that is free is worth a look.
+constexpr double kShortShare = 0.05;
 
 struct Group {
   std::string_view title;
@@ -81,8 +81,8 @@ constexpr Group kGroups[] = {
 
 class View {
  public:
-  View(std::ostream& out, const plist::Dictionary& info, std::optional<std::size_t> columns)
-      : out_(out), columns_(columns) {
+  View(const Page& page, const plist::Dictionary& info, bool showsZeros)
+      : page_(page), derived_(info), histograms_(nandHistograms(info)), showsZeros_(showsZeros) {
     for (const plist::Entry& entry : info) {
       std::string_view key = entry.key.view();
       if (key.starts_with(kNANDInfoKeyPrefix)) key.remove_prefix(kNANDInfoKeyPrefix.size());
@@ -91,7 +91,10 @@ class View {
   }
 
   void print() {
-    takeHistograms();
+    for (const auto& [stem, buckets] : histograms_) {
+      for (const NandBucket& bucket : buckets)
+        printed_.insert(bucket.key);
+    }
     for (const Group& group : kGroups) {
       if (group.title == kWriteAmplification) {
         printWriteAmplification();
@@ -103,32 +106,11 @@ class View {
       printHistogram(stem, buckets);
     constexpr std::string_view kRest[] = {"*"};
     printGroup({"Other", kRest});
+    printZeros();
   }
 
  private:
   using Values = std::map<std::string_view, plist::Value>;
-  struct Bucket {
-    std::uint64_t number;  // after the stem
-    std::uint64_t count;
-  };
-  using Buckets = std::map<std::string_view, Bucket>;  // by key
-
-  void takeHistograms() {
-    for (const auto& [key, value] : values_) {
-      const std::size_t stem = key.find_last_not_of("0123456789") + 1;
-      const std::string_view digits = key.substr(stem);
-      const auto count = number(key);
-      if (digits.empty() || digits.size() > 9 || !count) continue;
-      histograms_[key.substr(0, stem)][key] = {std::stoul(std::string(digits)), *count};
-    }
-    std::erase_if(histograms_,
-                  [](const auto& histogram) { return histogram.second.size() < kFewestBuckets; });
-    for (const auto& [stem, buckets] : histograms_) {
-      for (const auto& [key, bucket] : buckets)
-        printed_.insert(key);
-    }
-  }
-
   std::optional<std::uint64_t> number(std::string_view key) const {
     const auto at = values_.find(key);
     const auto value = at == values_.end() ? std::nullopt : at->second.number();
@@ -137,117 +119,122 @@ class View {
   }
 
   void title(std::string_view text) {
-    if (hasPrinted_) out_ << '\n';
+    if (hasPrinted_) page_.out << '\n';
     hasPrinted_ = true;
-    out_ << printable(text) << '\n';
+    page_.out << page_.styled(printable(text), Emphasis::Strong) << '\n';
   }
 
   // Prints the keys that exist and were not printed yet.
   void printGroup(const Group& group) {
-    Table table({{""}, {"", Table::Align::Right}, {""}}, 2);
+    Table table({{"", Table::Align::Whole}, {"", Table::Align::Right}, {""}}, 2);
     for (const std::string_view key : group.keys) {
       const bool isPrefix = key.ends_with('*');
       const std::string_view begin = key.substr(0, key.size() - (isPrefix ? 1 : 0));
       for (auto at = values_.lower_bound(begin); at != values_.end(); ++at) {
         if (isPrefix ? !at->first.starts_with(begin) : at->first != begin) break;
-        if (!printed_.insert(at->first).second) continue;
-        table.add({std::string(at->first), inlineText(at->second), remark(at->first)});
+        if (printed_.insert(at->first).second) addFigure(table, at->first, at->second);
       }
     }
     if (table.empty()) return;
     title(group.title);
-    table.print(out_, columns_);
+    table.print(page_);
   }
 
-  void printHistogram(std::string_view stem, const Buckets& buckets) {
-    std::vector<Bucket> sorted;
-    for (const auto& [key, bucket] : buckets)
-      sorted.push_back(bucket);
-    std::sort(sorted.begin(), sorted.end(),
-              [](const Bucket& a, const Bucket& b) { return a.number < b.number; });
-    const auto holds = [](const Bucket& bucket) { return bucket.count > 0; };
-    const auto first = std::find_if(sorted.begin(), sorted.end(), holds);
-    if (first == sorted.end()) {
-      return title(format("%s: %zu buckets, all 0", stem, sorted.size()));
+  void addFigure(Table& table, std::string_view key, const plist::Value& value) {
+    const bool isZero = number(key) == 0U;
+    if (isZero && !showsZeros_) return;
+    const auto emphasis =
+        (isErrorFigure(key) && !isZero) || isShort(key) ? Emphasis::Alarm : Emphasis::None;
+    table.add({{std::string(key), emphasis}, {inlineText(value), emphasis}, remark(key)});
+  }
+
+  void printHistogram(std::string_view stem, const std::vector<NandBucket>& buckets) {
+    const auto holds = [](const NandBucket& bucket) { return bucket.count > 0; };
+    const auto first = std::find_if(buckets.begin(), buckets.end(), holds);
+    if (first == buckets.end()) {
+      if (showsZeros_) title(format("%s: %zu buckets, all 0", stem, buckets.size()));
+      return;
     }
-    const auto end = std::find_if(sorted.rbegin(), sorted.rend(), holds).base();
+    const auto end = std::find_if(buckets.rbegin(), buckets.rend(), holds).base();
     std::vector<DistributionView::Bucket> bars;
-    addEmpty(bars, {sorted.begin(), first});
+    addEmpty(bars, {buckets.begin(), first});
     for (auto at = first; at != end; ++at)
       bars.push_back({std::to_string(at->number), at->count});
-    addEmpty(bars, {end, sorted.end()});
+    addEmpty(bars, {end, buckets.end()});
     title(stem);
-    printBuckets(out_, bars, columns_);
+    printBuckets(page_, bars);
   }
 
   // Empty buckets at an end of a histogram share a line.
-  static void addEmpty(std::vector<DistributionView::Bucket>& bars, std::span<const Bucket> empty) {
+  static void addEmpty(std::vector<DistributionView::Bucket>& bars,
+                       std::span<const NandBucket> empty) {
     if (empty.empty()) return;
     std::string label = std::to_string(empty.front().number);
     if (empty.size() > 1) appendFormat(label, " to %llu", empty.back().number);
     bars.push_back({std::move(label), 0});
   }
 
-  // The products and shares are approximations for people.
-  double real(std::string_view key) const { return static_cast<double>(number(key).value_or(0)); }
-
-  double virtualBlockBytes() const { return real("PagesPerVirtualBlock") * real("BytesPerPage"); }
-
   std::string remark(std::string_view key) const {
-    if (!number(key)) return {};
-    if (key == "ExportVersion") return format("0x%llx", number(key).value_or(0));
-    if (key == "formatDaysSince2000") {
-      const auto weeks = number(key).value_or(0);
-      if (weeks == 0 || weeks > 1'000'000) return "weeks";
-      const auto day = kDaysTo2000 + 7 * static_cast<std::int64_t>(weeks);
-      return format("weeks: formatted in the week from %s on", dateText(civilFromDays(day)));
+    const auto size = [](const std::optional<std::uint64_t>& bytes) {
+      return sizeText(static_cast<double>(*bytes));
+    };
+    if (key == "ExportVersion" && number(key)) return format("%#llx", *number(key));
+    if (key == "formatDaysSince2000" && number(key)) {
+      if (!derived_.formattedFrom) return "weeks";
+      return format("weeks: formatted in the week from %s on", dateText(*derived_.formattedFrom));
     }
-    if (key == "NumVirtualBlocks" && virtualBlockBytes() > 0) {
-      return format("of %s, %s in all", sizeText(virtualBlockBytes()),
-                    sizeText(virtualBlockBytes() * real(key)));
+    if (key == "NumVirtualBlocks" && derived_.capacityBytes) {
+      return format("of %s, %s in all", size(derived_.virtualBlockBytes),
+                    size(derived_.capacityBytes));
     }
-    if (key == "NumFreeVirtualBlocks") return share(key, "NumVirtualBlocks");
-    if (key == "NodesFree") return share(key, "NodesTotal");
-    if (key == "NumLogicalReads" || key == "NumLogicalWrites") {
-      return format("sectors of 4 KiB: %s", sizeText(real(key) * double{kSectorBytes}));
+    if (const auto share = freeShare(key)) return percentText(*share);
+    const auto& traffic =
+        key == "NumLogicalReads" ? derived_.logicalReadBytes : derived_.logicalWriteBytes;
+    if ((key == "NumLogicalReads" || key == "NumLogicalWrites") && traffic) {
+      return format("sectors of 4 KiB: %s", size(traffic));
     }
     return {};
   }
 
-  std::string share(std::string_view key, std::string_view whole) const {
-    if (!number(whole) || real(whole) <= 0) return {};
-    return format("%.1f %%", 100 * real(key) / real(whole));
+  std::optional<double> freeShare(std::string_view key) const {
+    if (key == "NumFreeVirtualBlocks") return derived_.freeBlocksShare;
+    if (key == "NodesFree") return derived_.freeNodesShare;
+    return std::nullopt;
   }
 
-  static std::string sizeText(double bytes) {
-    constexpr std::string_view kUnits[] = {"bytes", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
-    std::size_t unit = 0;
-    for (; bytes >= 1024 && unit + 1 < std::size(kUnits); ++unit)
-      bytes /= 1024;
-    return format("%.*f %s", unit == 0 ? 0 : 1, bytes, kUnits[unit]);
+  bool isShort(std::string_view key) const {
+    const auto share = freeShare(key);
+    return share && *share < kShortShare;
   }
 
   void printWriteAmplification() {
-    const double writes = real("NumLogicalWrites") * double{kSectorBytes};
-    if (writes <= 0 || !number("NumPhysicalErases") || virtualBlockBytes() <= 0) return;
+    if (!derived_.writeAmplification) return;
     title(kWriteAmplification);
-    out_ << format("  %.2f  erases x virtual block / logical writes\n",
-                   real("NumPhysicalErases") * virtualBlockBytes() / writes);
+    page_.out << format("  %.2f  erases x virtual block / logical writes\n",
+                        *derived_.writeAmplification);
   }
 
-  std::ostream& out_;
-  std::optional<std::size_t> columns_;
+  void printZeros() {
+    if (showsZeros_ || derived_.zeros == 0) return;
+    const bool isOne = derived_.zeros == 1;
+    if (hasPrinted_) page_.out << '\n';
+    page_.out << format("%s %s 0; --all shows %s\n", counted(derived_.zeros, "figure"),
+                        isOne ? "is" : "are", isOne ? "it" : "them");
+  }
+
+  const Page& page_;
+  const NandDerived derived_;
+  const std::map<std::string_view, std::vector<NandBucket>> histograms_;
+  const bool showsZeros_;
   Values values_;
   std::set<std::string_view> printed_;
-  std::map<std::string_view, Buckets> histograms_;
   bool hasPrinted_ = false;
 };
 
 }  // namespace
 
-void printNandInfo(std::ostream& out, const plist::Dictionary& info,
-                   std::optional<std::size_t> columns) {
-  View(out, info, columns).print();
+void printNandInfo(const Page& page, const plist::Dictionary& info, bool showsZeros) {
+  View(page, info, showsZeros).print();
 }
 
 }  // namespace tavrel

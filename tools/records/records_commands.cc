@@ -21,6 +21,7 @@
 #include "tools/records/record_reader.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_list.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -66,7 +67,7 @@ void list(ToolContext& context, const Selection& selection) {
   const auto files = recordFiles(context, selection);
   if (!files) return context.fail(files.error().message);
   constexpr auto kRight = Table::Align::Right;
-  Table table({{"TYPE", kRight}, {"DAY"}, {"RECORDS", kRight}, {"BYTES", kRight}});
+  Table table({{"TYPE", kRight}, {"DAY"}, {"RECORDS", kRight}, {"SIZE", kRight}});
   Json entries = Json::array();
   for (const RecordFile& file : *files) {
     std::uint64_t records = 0;
@@ -87,11 +88,15 @@ void list(ToolContext& context, const Selection& selection) {
     } else {
       table.add({std::to_string(file.is.type), format("%lld (%s)", file.is.day, date),
                  read ? std::to_string(records) : "?",
-                 status ? std::to_string(status->st_size) : "?"});
+                 status ? sizeText(static_cast<double>(status->st_size)) : "?"});
     }
   }
   if (context.json()) return context.printJson({{"files", std::move(entries)}});
-  if (!table.empty()) table.print(context.out(), context.columns());
+  if (table.empty()) {
+    context.out() << "no records\n";
+  } else {
+    table.print(context.page());
+  }
 }
 
 /// Prints the records of a selection, those of one day in the order of their times.
@@ -109,6 +114,7 @@ class RecordsView {
       const std::int64_t day = file->is.day;
       for (; file != files->end() && file->is.day == day; ++file)
         readFile(*file, rows);
+      hasPrinted_ = hasPrinted_ || !rows.empty();
       print(rows);
       rows.clear();
     }
@@ -120,7 +126,11 @@ class RecordsView {
     if (context_.json() && !follows_) document_.emplace(context_.out(), Json::object(), "records");
   }
   void end() {
-    if (document_) document_->end();
+    if (document_) {
+      document_->end();
+    } else if (!hasPrinted_ && !follows_) {
+      context_.out() << "no records\n";
+    }
   }
 
  private:
@@ -165,7 +175,7 @@ class RecordsView {
         out << row.text << '\n';
       }
     }
-    if (!table.empty()) table.print(out, context_.columns());
+    if (!table.empty()) table.print(context_.page());
   }
 
   void tellOnce(const std::string& message) {
@@ -183,6 +193,7 @@ class RecordsView {
   const bool follows_;
   std::map<std::string, RecordReader> readers_;  // by path
   std::set<std::string> told_;
+  bool hasPrinted_ = false;
   std::uint64_t faults_ = 0;
   std::string firstFault_;
   std::optional<JsonList> document_;

@@ -106,7 +106,7 @@ void list(ToolContext& context, const Arguments& arguments) {
     if (!noting.hasErrors() && !noting.hasPrinted()) context.out() << "no channels\n";
     return;
   }
-  printChannels(context.out(), *channels, arguments.flat, context.columns());
+  printChannels(context.page(), *channels, arguments.flat);
 }
 
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
@@ -124,7 +124,7 @@ void printOne(ToolContext& context, const Arguments& arguments, const plist::Dic
       const char* const what = arguments.delta ? "Change" : "Sample";
       context.out() << format("%s %u of %u\n", what, number, arguments.count);
     }
-    printSamples(context.out(), samples, arguments.delta, context.columns());
+    printSamples(context.page(), samples, arguments.delta);
   }
   context.out().flush();
 }

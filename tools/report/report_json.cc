@@ -7,6 +7,7 @@
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
 #include "ioreport/state_values.h"
+#include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
 
 namespace tavrel {
@@ -41,6 +42,11 @@ Json channelJson(const plist::Dictionary& channel) {
           {"unit_label", orNull(IOReportChannelGetUnitLabel(channel))}};
 }
 
+Json convertedJson(const plist::Dictionary& channel, std::int64_t value) {
+  const auto converted = convertedValue(channel, value);
+  return converted ? Json({{"value", converted->value}, {"unit", converted->unit}}) : Json();
+}
+
 Json statesJson(const plist::Dictionary& channel, bool isDelta) {
   Json states = Json::array();
   const std::int32_t current = IOReportStateGetCurrent(channel);
@@ -50,15 +56,22 @@ Json statesJson(const plist::Dictionary& channel, bool isDelta) {
   for (std::int32_t state = 0; state < IOReportStateGetCount(channel); ++state) {
     const auto i = static_cast<std::size_t>(state);
     const double duty = dutyCycle(elements, i, total);
+    const std::int64_t residency = elements.value(i, kStateResidency);
     states.push_back(
         {{"id", idOrNull(elements.value(i, kStateID))},
          {"name", orNull(names.at(i).string())},
          {"in_transitions", countOrNull(elements.value(i, kStateInTransitions), isDelta)},
-         {"residency", countOrNull(elements.value(i, kStateResidency), isDelta)},
+         {"residency", countOrNull(residency, isDelta)},
+         {"converted", residency < 0 ? Json() : convertedJson(channel, residency)},
          {"duty_cycle", std::isnan(duty) ? Json() : Json(duty)},
          {"current", state == current}});
   }
   return states;
+}
+
+Json bucketMean(std::int64_t hits, std::int64_t sum) {
+  if (hits <= 0 || sum == kInvalidValue) return nullptr;
+  return static_cast<double>(sum) / static_cast<double>(hits);
 }
 
 Json bucketsJson(const plist::Dictionary& channel, bool isDelta) {
@@ -69,12 +82,15 @@ Json bucketsJson(const plist::Dictionary& channel, bool isDelta) {
     std::int64_t upper = 0;
     hasBounds =
         hasBounds && IOReportHistogramGetBucketBounds(channel, i, &lower, &upper) == kKernelSuccess;
+    const std::int64_t hits = IOReportHistogramGetBucketHits(channel, i);
+    const std::int64_t sum = IOReportHistogramGetBucketSum(channel, i);
     buckets.push_back({{"lower", hasBounds ? Json(static_cast<std::uint64_t>(lower)) : Json()},
                        {"upper", hasBounds ? Json(static_cast<std::uint64_t>(upper)) : Json()},
-                       {"hits", countOrNull(IOReportHistogramGetBucketHits(channel, i), isDelta)},
+                       {"hits", countOrNull(hits, isDelta)},
                        {"minimum", orNull(IOReportHistogramGetBucketMinValue(channel, i))},
                        {"maximum", orNull(IOReportHistogramGetBucketMaxValue(channel, i))},
-                       {"sum", orNull(IOReportHistogramGetBucketSum(channel, i))}});
+                       {"sum", orNull(sum)},
+                       {"mean", bucketMean(hits, sum)}});
   }
   return buckets;
 }
@@ -95,7 +111,11 @@ Json sampleJson(const plist::Dictionary& channel, bool isDelta) {
   // The delta of a simple channel keeps the earlier time, which says nothing about it.
   const bool hasTime = elements && !(isDelta && form == kFormatSimple);
   json["timestamp"] = hasTime ? Json(elements.timestamp(0)) : Json();
-  if (form == kFormatSimple) json["value"] = orNull(IOReportSimpleGetIntegerValue(channel));
+  if (form == kFormatSimple) {
+    const std::int64_t value = IOReportSimpleGetIntegerValue(channel);
+    json["value"] = orNull(value);
+    json["converted"] = convertedJson(channel, value);
+  }
   if (form == kFormatState) json["states"] = statesJson(channel, isDelta);
   if (form == kFormatHistogram) json["buckets"] = bucketsJson(channel, isDelta);
   if (form == kFormatSimpleArray) json["values"] = arrayJson(channel);

@@ -11,14 +11,13 @@
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
 #include "ioreport/state_values.h"
+#include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
-
-constexpr std::size_t kBarWidth = 24;
-constexpr std::uint64_t kBarSteps = 1000;  // of a whole
 
 std::string textOr(std::optional<std::string_view> text, std::string_view otherwise) {
   return std::string(text.value_or(otherwise));
@@ -71,7 +70,7 @@ class Place {
   std::string names_[3];
 };
 
-std::vector<std::string> cellsOf(const plist::Dictionary& channel) {
+std::vector<Table::Cell> cellsOf(const plist::Dictionary& channel) {
   std::uint64_t type = 0;
   const bool hasType = getChannelType(channel, type) == kKernelSuccess;
   return {formatName(IOReportChannelGetFormat(channel)),
@@ -84,24 +83,22 @@ std::vector<std::string> cellsOf(const plist::Dictionary& channel) {
 // Prints samples: simple channels in a table for each group, others in blocks of their own.
 class SamplePrinter {
  public:
-  SamplePrinter(std::ostream& out, bool isDelta, std::optional<std::size_t> columns)
-      : out_(out), isDelta_(isDelta), columns_(columns) {}
+  SamplePrinter(const Page& page, bool isDelta) : page_(page), isDelta_(isDelta) {}
 
   void print(const plist::Dictionary& channel) {
     Place place(channel);
     if (place != place_) {
       flush();
       place.forNew(place_, [&](std::size_t depth, const std::string& name) {
-        if (depth == 0 && place_ != Place()) out_ << '\n';
-        out_ << std::string(2 * depth, ' ') << printable(name) << '\n';
+        if (depth == 0 && place_ != Place()) page_.out << '\n';
+        page_.out << std::string(2 * depth, ' ') << page_.styled(printable(name), Emphasis::Strong)
+                  << '\n';
       });
       place_ = std::move(place);
     }
     switch (IOReportChannelGetFormat(channel)) {
       case kFormatSimple:
-        simple_.push_back({nameOf(channel), signedText(IOReportSimpleGetIntegerValue(channel)),
-                           textOr(IOReportChannelGetUnitLabel(channel), "")});
-        return;
+        return addSimple(channel);
       case kFormatState:
         return printStates(channel);
       case kFormatHistogram:
@@ -109,16 +106,25 @@ class SamplePrinter {
       case kFormatSimpleArray:
         return printArray(channel);
       default:
-        simple_.push_back({nameOf(channel), "-", "of unknown format"});
+        simple_.push_back({nameOf(channel), "- (unknown format)"});
     }
   }
 
   void flush() {
-    printTable({{""}, {"", Table::Align::Right}, {""}}, std::exchange(simple_, {}), indent());
+    printTable({{""}, {"", Table::Align::Right}}, std::exchange(simple_, {}), indent());
   }
 
  private:
-  using Rows = std::vector<std::vector<std::string>>;
+  using Rows = std::vector<std::vector<Table::Cell>>;
+
+  void addSimple(const plist::Dictionary& channel) {
+    const std::int64_t value = IOReportSimpleGetIntegerValue(channel);
+    const auto converted = convertedValue(channel, value);
+    const std::string label = textOr(IOReportChannelGetUnitLabel(channel), "");
+    std::string text = converted ? textOf(*converted) : signedText(value);
+    if (!converted && !label.empty()) text += ' ' + label;
+    simple_.push_back({nameOf(channel), std::move(text)});
+  }
 
   std::size_t indent() const { return 2 * place_.depth(); }
 
@@ -127,23 +133,19 @@ class SamplePrinter {
     Table table(std::move(columns), indent);
     for (auto& row : rows)
       table.add(std::move(row));
-    table.print(out_, columns_);
+    table.print(page_);
   }
 
   void printBlock(const plist::Dictionary& channel, std::vector<Table::Column> columns, Rows rows) {
     flush();
-    out_ << std::string(indent(), ' ') << printable(titleOf(channel));
-    out_ << (rows.empty() ? ": cannot be read\n" : "\n");
+    page_.out << std::string(indent(), ' ') << printable(titleOf(channel));
+    page_.out << (rows.empty() ? ": cannot be read\n" : "\n");
     printTable(std::move(columns), std::move(rows), indent() + 2);
   }
 
   std::string residencyText(const plist::Dictionary& channel, std::int64_t residency) const {
-    const std::int64_t unit = IOReportChannelGetUnit(channel);
-    const double seconds = unit == kInvalidValue || residency < 0
-                               ? std::nan("")
-                               : IOReportScaleValue(static_cast<std::uint64_t>(residency),
-                                                    static_cast<std::uint64_t>(unit), kUnitSeconds);
-    return std::isnan(seconds) ? countText(residency, isDelta_) : format("%.3f s", seconds);
+    const auto converted = residency < 0 ? std::nullopt : convertedValue(channel, residency);
+    return converted ? textOf(*converted) : countText(residency, isDelta_);
   }
 
   void printStates(const plist::Dictionary& channel) {
@@ -155,12 +157,9 @@ class SamplePrinter {
     for (std::size_t i = 0; i < states.count(); ++i) {
       const auto name = names.at(i).string();
       const double duty = dutyCycle(states, i, total);
-      const bool hasDuty = !std::isnan(duty);
-      const auto steps = static_cast<std::uint64_t>(hasDuty ? duty * double{kBarSteps} : 0.0);
       const std::string entered = countText(states.value(i, kStateInTransitions), isDelta_);
       rows.push_back({name ? std::string(*name) : format("%#llx", states.value(i, kStateID)),
-                      hasDuty ? format("%.1f%%", duty * 100.0) : "-",
-                      bar(duty > 0.0 ? std::max<std::uint64_t>(steps, 1) : 0, kBarSteps, kBarWidth),
+                      std::isnan(duty) ? "-" : percentText(duty), Table::Cell::bar(duty, 1),
                       residencyText(channel, states.value(i, kStateResidency)),
                       "entered " + entered,
                       static_cast<std::int32_t>(i) == current ? "current" : ""});
@@ -168,7 +167,7 @@ class SamplePrinter {
     printBlock(channel,
                {{""},
                 {"", Table::Align::Right},
-                {""},
+                {"", Table::Align::Bar},
                 {"", Table::Align::Right},
                 {"", Table::Align::Right},
                 {""}},
@@ -207,10 +206,11 @@ class SamplePrinter {
                    signedText(IOReportHistogramGetBucketMaxValue(channel, i)));
       }
       rows.push_back({boundsText(channel, i, hasBounds), countText(hitsOf, isDelta_),
-                      bar(hitsOf > 0 ? static_cast<std::uint64_t>(hitsOf) : 0, largest, kBarWidth),
+                      Table::Cell::bar(static_cast<double>(hitsOf), static_cast<double>(largest)),
                       std::move(spread)});
     }
-    printBlock(channel, {{""}, {"", Table::Align::Right}, {""}, {""}}, std::move(rows));
+    printBlock(channel, {{""}, {"", Table::Align::Right}, {"", Table::Align::Bar}, {""}},
+               std::move(rows));
   }
 
   void printArray(const plist::Dictionary& channel) {
@@ -220,31 +220,29 @@ class SamplePrinter {
     Rows rows;
     for (std::int32_t i = 0; i < count; ++i) {
       if (i % kColumns == 0) rows.push_back({format("[%d]", i)});
-      rows.back().push_back(signedText(IOReportArrayGetValueAtIndex(channel, i)));
+      rows.back().emplace_back(signedText(IOReportArrayGetValueAtIndex(channel, i)));
     }
     constexpr auto kRight = Table::Align::Right;
     printBlock(channel, {{"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}},
                std::move(rows));
   }
 
-  std::ostream& out_;
+  const Page& page_;
   const bool isDelta_;
-  const std::optional<std::size_t> columns_;
   Place place_;
   Rows simple_;
 };
 
 }  // namespace
 
-void printChannels(std::ostream& out, const plist::Dictionary& channels, bool flat,
-                   std::optional<std::size_t> columns) {
+void printChannels(const Page& page, const plist::Dictionary& channels, bool flat) {
   std::vector<Table::Column> titles{
       {"CHANNEL"}, {"FORMAT"}, {"UNIT"}, {"CATEGORIES"}, {"ELEMENTS", Table::Align::Right}, {"ID"}};
   if (flat) titles.insert(titles.begin(), {{"DRIVER"}, {"GROUP"}, {"SUBGROUP"}});
   Table table(std::move(titles));
   Place last;
   for (const plist::Dictionary& channel : channelsIn(channels)) {
-    std::vector<std::string> cells = cellsOf(channel);
+    std::vector<Table::Cell> cells = cellsOf(channel);
     Place place(channel);
     if (flat) {
       cells.insert(cells.begin(),
@@ -260,12 +258,15 @@ void printChannels(std::ostream& out, const plist::Dictionary& channels, bool fl
     table.add(std::move(cells));
     last = std::move(place);
   }
-  if (!table.empty()) table.print(out, columns);
+  if (table.empty()) {
+    page.out << "no channels\n";
+  } else {
+    table.print(page);
+  }
 }
 
-void printSamples(std::ostream& out, const plist::Dictionary& samples, bool isDelta,
-                  std::optional<std::size_t> columns) {
-  SamplePrinter printer(out, isDelta, columns);
+void printSamples(const Page& page, const plist::Dictionary& samples, bool isDelta) {
+  SamplePrinter printer(page, isDelta);
   for (const plist::Dictionary& channel : channelsIn(samples))
     printer.print(channel);
   printer.flush();

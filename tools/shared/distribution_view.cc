@@ -4,18 +4,13 @@
 #include <charconv>
 #include <cmath>
 #include <limits>
-#include <ostream>
 
 #include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::size_t kWidestBar = 40;
-constexpr std::size_t kNarrowestBar = 8;
-constexpr std::size_t kColumnsInPipe = 80;
-
-// The ends of a bucket, from a label such as "(-inf, 10]". Other labels go last.
+// The ends of a bucket, from a label such as "(-inf, 10]". Labels that are no such text go last.
 std::pair<double, double> endsOf(std::string_view label) {
   constexpr double kLast = std::numeric_limits<double>::infinity();
   const auto read = [](std::string_view text) {
@@ -47,23 +42,16 @@ std::optional<double> DistributionView::standardDeviation() const {
   return std::sqrt(squaredDeviations / static_cast<double>(count));
 }
 
-void printBuckets(std::ostream& out, std::span<const DistributionView::Bucket> buckets,
-                  std::optional<std::size_t> columns) {
+void printBuckets(const Page& page, std::span<const DistributionView::Bucket> buckets) {
   std::uint64_t largest = 0;
-  std::size_t labelWidth = 0;
-  for (const auto& bucket : buckets) {
+  for (const auto& bucket : buckets)
     largest = std::max(largest, bucket.count);
-    labelWidth = std::max(labelWidth, displayWidth(printable(bucket.label)));
-  }
-  const std::size_t taken = 2 + labelWidth + 2 + std::to_string(largest).size() + 2;
-  const std::size_t width = columns.value_or(kColumnsInPipe);
-  const std::size_t barWidth =
-      std::clamp(width > taken ? width - taken : 0, kNarrowestBar, kWidestBar);
-  Table table({{""}, {"", Table::Align::Right}, {""}}, 2);
+  Table table({{"", Table::Align::Whole}, {"", Table::Align::Right}, {"", Table::Align::Bar}}, 2);
   for (const auto& bucket : buckets) {
-    table.add({bucket.label, std::to_string(bucket.count), bar(bucket.count, largest, barWidth)});
+    table.add({bucket.label, std::to_string(bucket.count),
+               Table::Cell::bar(static_cast<double>(bucket.count), static_cast<double>(largest))});
   }
-  table.print(out, std::nullopt);
+  table.print(page);
 }
 
 bool isSummary(const plist::Value& entry) {

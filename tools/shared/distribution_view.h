@@ -3,7 +3,6 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <iosfwd>
 #include <optional>
 #include <span>
 #include <string>
@@ -11,6 +10,7 @@
 #include <vector>
 
 #include "base/plist.h"
+#include "tools/shared/page.h"
 
 namespace tavrel {
 
@@ -32,9 +32,8 @@ struct DistributionView {
   std::optional<double> standardDeviation() const;
 };
 
-/// One line per bucket: label, count, and a bar in proportion to the largest count.
-void printBuckets(std::ostream& out, std::span<const DistributionView::Bucket> buckets,
-                  std::optional<std::size_t> columns);
+/// One line a bucket: label, count, and a bar in proportion to the largest count.
+void printBuckets(const Page& page, std::span<const DistributionView::Bucket> buckets);
 
 /// Whether an entry of "BHDistributions" is a summary: minimum, maximum, mean, squared deviations,
 /// count.

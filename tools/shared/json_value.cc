@@ -1,16 +1,15 @@
 #include "tools/shared/json_value.h"
 
-#include <algorithm>
-#include <charconv>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <vector>
 
-#include "base/civil_time.h"
+#include "base/base64.h"
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/text.h"
-#include "tools/shared/base64.h"
+#include "tools/shared/sorted_entries.h"
 
 namespace tavrel {
 namespace {
@@ -21,9 +20,6 @@ using Json = nlohmann::ordered_json;
 constexpr std::string_view kDataMember = "$data";
 constexpr std::string_view kDateMember = "$date";
 constexpr std::string_view kRealMember = "$real";
-
-// The calendar arithmetic covers years of 40 bits.
-constexpr double kLargestSeconds = 3e16;
 
 Json special(std::string_view member, std::string text) {
   return {{std::string(member), std::move(text)}};
@@ -36,14 +32,8 @@ void appendMember(Json& object, std::string key, Json value) {
 }
 
 Json jsonOfDictionary(const plist::Dictionary& dictionary) {
-  std::vector<const plist::Entry*> entries;
-  entries.reserve(dictionary.size());
-  for (const plist::Entry& entry : dictionary)
-    entries.push_back(&entry);
-  std::sort(entries.begin(), entries.end(),
-            [](const auto* a, const auto* b) { return a->key.view() < b->key.view(); });
   Json object = Json::object();
-  for (const plist::Entry* entry : entries) {
+  for (const plist::Entry* entry : sortedEntries(dictionary)) {
     std::string key(entry->key.view());
     if (key.starts_with('$')) key.insert(0, 1, '$');
     appendMember(object, std::move(key), jsonOf(entry->value));
@@ -62,9 +52,9 @@ Json jsonOfNumber(const plist::Number& number) {
 
 Expected<plist::Value> valueOfSpecial(std::string_view member, std::string_view text) {
   if (member == kDataMember) {
-    const auto bytes = parseBase64(text);
-    if (!bytes) return Error{"\"$data\" is no base64"};
-    return plist::Value(plist::Data(*bytes));
+    std::vector<std::byte> bytes;
+    if (!readBase64(text, bytes)) return Error{"\"$data\" is no base64"};
+    return plist::Value(plist::Data(bytes));
   }
   if (member == kDateMember) {
     const auto date = parseIsoDate(text);
@@ -206,8 +196,11 @@ Json jsonOf(const plist::Value& value) {
       return special(kDateMember, isoDateText(*value.date()));
     case Kind::String:
       return std::string(*value.string());
-    case Kind::Data:
-      return special(kDataMember, base64Text(value.data().bytes()));
+    case Kind::Data: {
+      std::string text;
+      appendBase64(text, value.data().bytes());
+      return special(kDataMember, std::move(text));
+    }
     case Kind::Array: {
       Json array = Json::array();
       for (const plist::Value& element : value.array())
@@ -226,74 +219,6 @@ Expected<plist::Value> parseJsonValue(std::string_view text) {
     return Error{builder.message()};
   }
   return builder.takeResult();
-}
-
-std::string isoDateText(plist::Date date) {
-  const double seconds = date.secondsSinceEpoch();
-  if (!(std::fabs(seconds) < kLargestSeconds)) {
-    return "@" + numberText(date.secondsSince1970());
-  }
-  const double whole = std::floor(seconds);
-  const CivilTime time =
-      civilFromSeconds(static_cast<std::int64_t>(whole) + std::int64_t{978307200});
-  std::string text =
-      format("%sT%02u:%02u:%02u", dateText(time.date), time.hour, time.minute, time.second);
-  if (seconds != whole) {
-    char digits[1100];
-    const auto [end, error] =
-        std::to_chars(digits, digits + sizeof digits, seconds - whole, std::chars_format::fixed);
-    text.append(digits + 1, end);  // without the leading 0
-  }
-  return text + "Z";
-}
-
-Expected<plist::Date> parseIsoDate(std::string_view text) {
-  const Error error{format("not a date: %s: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD", text)};
-  const auto real = [](std::string_view digits) -> std::optional<double> {
-    double value = 0;
-    const auto [stop, code] = std::from_chars(digits.data(), digits.data() + digits.size(), value);
-    if (digits.empty() || code != std::errc() || stop != digits.data() + digits.size()) return {};
-    return value;
-  };
-  if (text.starts_with('@')) {
-    const auto seconds = real(text.substr(1));
-    if (!seconds) return error;
-    return plist::Date::since1970(*seconds);
-  }
-
-  const std::size_t mark = text.find('T');
-  const auto date = parseDate(text.substr(0, mark));
-  if (!date) return error;
-  CivilTime time{*date, 0, 0, 0};
-  double fraction = 0;
-  if (mark != std::string_view::npos) {
-    std::string_view clock = text.substr(mark + 1);
-    if (clock.size() < 9 || clock[2] != ':' || clock[5] != ':' || !clock.ends_with('Z')) {
-      return error;
-    }
-    clock.remove_suffix(1);
-    const auto field = [&](std::size_t at, unsigned largest) -> std::optional<unsigned> {
-      unsigned value = 0;
-      const char* const end = clock.data() + at + 2;
-      const auto [stop, code] = std::from_chars(clock.data() + at, end, value);
-      if (code != std::errc() || stop != end || value > largest) return {};
-      return value;
-    };
-    const auto hour = field(0, 23), minute = field(3, 59), second = field(6, 59);
-    if (!hour || !minute || !second) return error;
-    time = {*date, *hour, *minute, *second};
-    if (clock.size() > 8) {
-      const std::string_view digits = clock.substr(8);
-      if (digits[0] != '.' || digits.find_first_not_of("0123456789", 1) != std::string_view::npos) {
-        return error;
-      }
-      const auto value = real(digits);
-      if (!value) return error;
-      fraction = *value;
-    }
-  }
-  return plist::Date::sinceEpoch(
-      static_cast<double>(secondsFromCivil(time) - std::int64_t{978307200}) + fraction);
 }
 
 }  // namespace tavrel

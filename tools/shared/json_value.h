@@ -27,8 +27,4 @@ nlohmann::ordered_json jsonOf(const plist::Value& value);
 /// Reads a document. The error says what is wrong and where.
 Expected<plist::Value> parseJsonValue(std::string_view text);
 
-/// "2026-11-16T18:02:18Z"; instants beyond the calendar as "@" and seconds since 1970.
-std::string isoDateText(plist::Date date);
-Expected<plist::Date> parseIsoDate(std::string_view text);
-
 }  // namespace tavrel

@@ -1,7 +1,9 @@
 #include "tools/shared/table.h"
 
 #include <algorithm>
+#include <numeric>
 #include <ostream>
+#include <utility>
 
 #include "base/format.h"
 #include "base/utf8.h"
@@ -69,76 +71,93 @@ std::size_t displayWidth(std::string_view text) {
   }));
 }
 
-std::string bar(std::uint64_t value, std::uint64_t largest, std::size_t width) {
-  if (value == 0 || largest == 0) return {};
-  const double share = static_cast<double>(value) / static_cast<double>(largest);
-  const auto marks = static_cast<std::size_t>(share * static_cast<double>(width));
-  return std::string(std::clamp<std::size_t>(marks, 1, std::max<std::size_t>(width, 1)), '#');
-}
-
 std::string counted(std::uint64_t count, std::string_view what) {
   return format("%llu %s%s", count, what, count == 1 ? "" : "s");
+}
+
+Table::Cell Table::Cell::bar(double value, double largest) {
+  Cell cell("");
+  if (value > 0 && largest > 0) cell.share = std::min(value / largest, 1.0);
+  return cell;
 }
 
 Table::Table(std::vector<Column> columns, std::size_t indent)
     : columns_(std::move(columns)), indent_(indent) {}
 
-void Table::add(std::vector<std::string> cells) {
-  cells.resize(columns_.size());
-  for (std::string& cell : cells)
-    cell = printable(cell);
+void Table::add(std::vector<Cell> cells) {
+  cells.resize(columns_.size(), "");
+  for (Cell& cell : cells)
+    cell.text = printable(cell.text);
   rows_.push_back(std::move(cells));
 }
 
-void Table::print(std::ostream& out, std::optional<std::size_t> columns) const {
-  if (columns_.empty()) return;
+std::vector<std::size_t> Table::widths(const Page& page) const {
   std::vector<std::size_t> widths;
-  bool hasTitles = false;
   for (std::size_t i = 0; i < columns_.size(); ++i) {
     std::size_t width = displayWidth(columns_[i].title);
-    hasTitles = hasTitles || width > 0;
     for (const auto& row : rows_)
-      width = std::max(width, displayWidth(row[i]));
-    widths.push_back(columns ? width : std::min(width, kWidestPadding));
+      width = std::max(width, displayWidth(row[i].text));
+    widths.push_back(page.columns ? width : std::min(width, kWidestPadding));
   }
+  const std::size_t taken =
+      std::accumulate(widths.begin(), widths.end(), indent_ + kGap.size() * (columns_.size() - 1));
 
-  if (columns) {
-    std::size_t total = indent_ + kGap.size() * (columns_.size() - 1);
-    std::size_t widest = 0;
-    for (std::size_t i = 0; i < columns_.size(); ++i) {
-      total += widths[i];
-      const bool canGive = columns_[i].align == Align::Left;
-      const bool widestGives = columns_[widest].align == Align::Left;
-      if (canGive && (!widestGives || widths[i] > widths[widest])) widest = i;
-    }
-    if (total > *columns && columns_[widest].align == Align::Left) {
-      const std::size_t surplus = total - *columns;
-      const std::size_t narrowest = std::min(kNarrowestColumn, widths[widest]);
-      widths[widest] = widths[widest] > surplus + narrowest ? widths[widest] - surplus : narrowest;
+  std::optional<std::size_t> widest;  // of those that can be cut
+  for (std::size_t i = 0; i < columns_.size(); ++i) {
+    if (columns_[i].align == Align::Bar) {
+      const std::size_t room = page.barColumns() > taken ? page.barColumns() - taken : 0;
+      widths[i] = std::max(room, kNarrowestColumn);
+    } else if (columns_[i].align == Align::Left && (!widest || widths[i] > widths[*widest])) {
+      widest = i;
     }
   }
+  if (page.columns && taken > *page.columns && widest) {
+    std::size_t& width = widths[*widest];
+    const std::size_t surplus = taken - *page.columns;
+    const std::size_t narrowest = std::min(kNarrowestColumn, width);
+    width = width > surplus + narrowest ? width - surplus : narrowest;
+  }
+  return widths;
+}
 
-  const auto printRow = [&](const auto& cellOf) {
-    std::string line(indent_, ' ');
-    for (std::size_t i = 0; i < columns_.size(); ++i) {
-      const std::string& cell = cellOf(i);
-      std::string shown = cell;
-      if (columns && displayWidth(cell) > widths[i]) {
-        shown = firstColumns(cell, widths[i] - 1);
-        shown += "…";
-      }
-      const std::size_t width = displayWidth(shown);
-      const std::string padding(widths[i] > width ? widths[i] - width : 0, ' ');
-      if (i > 0) line += kGap;
-      line += columns_[i].align == Align::Right ? padding + shown : shown + padding;
+void Table::printRow(const Page& page, const std::vector<Cell>& row,
+                     const std::vector<std::size_t>& widths) const {
+  std::string line(indent_, ' ');
+  std::size_t blanks = 0;  // that are owed to what follows
+  for (std::size_t i = 0; i < columns_.size(); ++i) {
+    if (i > 0) blanks += kGap.size();
+    std::string shown = row[i].text;
+    if (row[i].share > 0) {
+      const auto marks = static_cast<std::size_t>(row[i].share * static_cast<double>(widths[i]));
+      shown = std::string(std::max<std::size_t>(marks, 1), '#');
+    } else if (page.columns && displayWidth(shown) > widths[i]) {
+      shown = std::string(firstColumns(shown, widths[i] - 1)) + "…";
     }
-    line.erase(line.find_last_not_of(' ') + 1);
-    out << line << '\n';
-  };
-  if (hasTitles) printRow([&](std::size_t i) -> const std::string& { return columns_[i].title; });
-  for (const auto& row : rows_) {
-    printRow([&](std::size_t i) -> const std::string& { return row[i]; });
+    const std::size_t width = displayWidth(shown);
+    const std::size_t padding = widths[i] > width ? widths[i] - width : 0;
+    if (columns_[i].align == Align::Right) blanks += padding;
+    if (!shown.empty()) {
+      line.append(std::exchange(blanks, 0), ' ');
+      line += page.styled(shown, row[i].emphasis);
+    }
+    if (columns_[i].align != Align::Right) blanks += padding;
   }
+  if (line.size() == indent_) line.clear();
+  page.out << line << '\n';
+}
+
+void Table::print(const Page& page) const {
+  if (columns_.empty()) return;
+  const std::vector<std::size_t> all = widths(page);
+  std::vector<Cell> titles;
+  bool hasTitles = false;
+  for (const Column& column : columns_) {
+    titles.emplace_back(column.title, Emphasis::Strong);
+    hasTitles = hasTitles || !column.title.empty();
+  }
+  if (hasTitles) printRow(page, titles, all);
+  for (const auto& row : rows_)
+    printRow(page, row, all);
 }
 
 }  // namespace tavrel

@@ -9,6 +9,8 @@
 #include <string_view>
 #include <vector>
 
+#include "tools/shared/page.h"
+
 namespace tavrel {
 
 /// `text` on one line and harmless to a terminal: control characters and malformed bytes become
@@ -18,36 +20,53 @@ std::string printable(std::string_view text);
 /// The columns of `text` on a terminal: one per code point.
 std::size_t displayWidth(std::string_view text);
 
-/// A bar of `value` out of `largest` in at most `width` columns; at least one mark unless 0.
-std::string bar(std::uint64_t value, std::uint64_t largest, std::size_t width);
-
 /// "1 value", "2 values".
 std::string counted(std::uint64_t count, std::string_view what);
 
-/// Rows of texts in aligned columns, two blanks between them. Cells are made printable.
+/// Rows of texts in aligned columns, two blanks between them.
 class Table {
  public:
-  enum class Align : std::uint8_t { Left, Right };
+  /// Text to the left or to the right; text that is never cut; bars.
+  enum class Align : std::uint8_t { Left, Right, Whole, Bar };
   struct Column {
     std::string title;
     Align align = Align::Left;
+  };
+  struct Cell {
+    Cell(const char* cellText) : text(cellText) {}
+    Cell(std::string cellText, Emphasis cellEmphasis = Emphasis::None)
+        : text(std::move(cellText)), emphasis(cellEmphasis) {}
+    /// A bar of `value` out of `largest` of what the column has room for: at least one mark unless
+    /// 0.
+    static Cell bar(double value, double largest);
+
+    std::string text;  // made printable by the table
+    Emphasis emphasis = Emphasis::None;
+    double share = 0;  // of a bar
   };
 
   /// Each row begins with `indent` blanks.
   explicit Table(std::vector<Column> columns, std::size_t indent = 0);
 
   /// Missing cells are empty; surplus ones are dropped.
-  void add(std::vector<std::string> cells);
+  void add(std::vector<Cell> cells);
   bool empty() const { return rows_.empty(); }
 
-  /// With `columns`, the width of a terminal, the widest column of left-aligned text is cut ("…")
-  /// as far as needed to fit; without it, cells are whole, and long ones shift the rest of their
-  /// row. Titles are not printed when all are empty.
-  void print(std::ostream& out, std::optional<std::size_t> columns) const;
+  /// On a terminal the widest column of left-aligned text is cut ("…") as far as needed to fit;
+  /// elsewhere cells are whole, and long ones push the rest of their row aside. Bars take the
+  /// columns that are left. Titles that are all empty are not printed.
+  void print(const Page& page) const;
+  void print(std::ostream& out, std::optional<std::size_t> columns) const {
+    print(Page{out, columns});
+  }
 
  private:
+  std::vector<std::size_t> widths(const Page& page) const;
+  void printRow(const Page& page, const std::vector<Cell>& row,
+                const std::vector<std::size_t>& widths) const;
+
   std::vector<Column> columns_;
-  std::vector<std::vector<std::string>> rows_;
+  std::vector<std::vector<Cell>> rows_;
   std::size_t indent_;
 };
 

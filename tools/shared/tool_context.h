@@ -24,6 +24,7 @@
 #include <string_view>
 
 #include "tools/shared/command.h"
+#include "tools/shared/page.h"
 
 namespace tavrel {
 
@@ -57,6 +58,8 @@ struct ToolStreams {
   /// are then never cut.
   std::optional<std::size_t> columns = std::nullopt;
   bool errorIsTerminal = false;
+  /// Whether `out` is a terminal that shows colours to a user who wants them.
+  bool outIsColoured = false;
 };
 
 class ToolContext {
@@ -88,6 +91,8 @@ class ToolContext {
   std::istream& in() { return streams_.in; }
   std::ostream& out() { return streams_.out; }
   std::ostream& error() { return streams_.error; }
+  /// `out()` with what is known of its terminal.
+  Page page() { return {streams_.out, streams_.columns, streams_.outIsColoured}; }
   /// Nothing in a pipe.
   std::optional<std::size_t> columns() const { return streams_.columns; }
   /// Whether to show progress of long work, on `error()`.

@@ -5,8 +5,8 @@
 #include <optional>
 
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/utf8.h"
-#include "tools/shared/json_value.h"
 
 namespace tavrel {
 namespace {

@@ -1,12 +1,11 @@
 #include "tools/shared/value_text.h"
 
-#include <algorithm>
 #include <cmath>
 #include <ostream>
-#include <vector>
 
 #include "base/format.h"
 #include "base/text.h"
+#include "tools/shared/sorted_entries.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -16,17 +15,6 @@ using plist::Kind;
 
 bool isFilledContainer(const plist::Value& value) {
   return !value.array().empty() || !value.dictionary().empty();
-}
-
-// Borrowed from the dictionary.
-std::vector<std::pair<std::string_view, const plist::Value*>> sortedMembers(
-    const plist::Dictionary& dictionary) {
-  std::vector<std::pair<std::string_view, const plist::Value*>> members;
-  for (const plist::Entry& entry : dictionary)
-    members.emplace_back(entry.key, &entry.value);
-  std::sort(members.begin(), members.end(),
-            [](const auto& a, const auto& b) { return a.first < b.first; });
-  return members;
 }
 
 void printMember(std::ostream& out, std::string_view name, const plist::Value& value,
@@ -83,10 +71,10 @@ std::string inlineText(const plist::Value& value) {
     return '[' + text + ']';
   }
   if (const auto dictionary = value.dictionary()) {
-    for (const auto& [key, member] : sortedMembers(dictionary)) {
+    for (const plist::Entry* entry : sortedEntries(dictionary)) {
       if (!text.empty()) text += ", ";
-      appendQuoted(text, key);
-      text += ": " + inlineText(*member);
+      appendQuoted(text, entry->key);
+      text += ": " + inlineText(entry->value);
     }
     return '{' + text + '}';
   }
@@ -111,8 +99,8 @@ void printOutline(std::ostream& out, const plist::Value& value, std::size_t inde
     return;
   }
   const auto dictionary = value.dictionary();
-  for (const auto& [key, member] : sortedMembers(dictionary))
-    printMember(out, printable(key), *member, indent);
+  for (const plist::Entry* entry : sortedEntries(dictionary))
+    printMember(out, printable(entry->key), entry->value, indent);
 }
 
 std::string shortNumber(double value) {

@@ -172,9 +172,7 @@ class Collector {
   void read(Ticks at) {
     Platform& platform = context_.platform();
     const auto now = saturatingInt64(std::floor(platform.clock->now().secondsSince1970()));
-    const std::int64_t secondsInDay = (now % kSecondsPerDay + kSecondsPerDay) % kSecondsPerDay;
-    readings_.push_back({platform.statistics->BHDaysSince1970(),
-                         static_cast<std::uint32_t>(secondsInDay), at,
+    readings_.push_back({platform.statistics->BHDaysSince1970(), secondOfDay(now), at,
                          readMachine(context_.root())});
     ++count_;
   }

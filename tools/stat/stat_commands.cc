@@ -36,12 +36,6 @@ struct Arguments {
   std::optional<std::uint32_t> days;
 };
 
-// The offset of this instant within its day.
-std::uint32_t secondsOfDay(Clock& clock) {
-  const auto now = saturatingInt64(std::floor(clock.now().secondsSince1970()));
-  return static_cast<std::uint32_t>((now % kSecondsPerDay + kSecondsPerDay) % kSecondsPerDay);
-}
-
 // Changes the store in one transaction.
 template <class Change>
 void change(ToolContext& context, Change change) {
@@ -84,7 +78,8 @@ void record(ToolContext& context, const Arguments& arguments) {
     values.push_back(*value);
   }
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  const std::uint32_t seconds = secondsOfDay(context.platform().clock);
+  const double now = context.platform().clock->now().secondsSince1970();
+  const std::uint32_t seconds = secondOfDay(saturatingInt64(std::floor(now)));
   change(context, [&](SqliteBatch& batch) {
     Status done = Done{};
     for (std::size_t i = 0; done && i < values.size(); ++i) {

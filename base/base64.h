@@ -1,4 +1,4 @@
-// Base64, as the XML encoding of property lists writes data.
+// Bytes as base64 text.
 #pragma once
 
 #include <string>
@@ -7,7 +7,7 @@
 
 #include "base/bytes.h"
 
-namespace tavrel::plist {
+namespace tavrel {
 
 void appendBase64(std::string& out, ByteSpan bytes);
 
@@ -15,4 +15,4 @@ void appendBase64(std::string& out, ByteSpan bytes);
 /// any other character, and for a text whose end does not fit its padding.
 bool readBase64(std::string_view text, std::vector<std::byte>& out);
 
-}  // namespace tavrel::plist
+}  // namespace tavrel

@@ -1,9 +1,9 @@
-#include "platform/plist/base64.h"
+#include "base/base64.h"
 
 #include <array>
 #include <cstdint>
 
-namespace tavrel::plist {
+namespace tavrel {
 namespace {
 
 constexpr std::string_view kDigits =
@@ -72,4 +72,4 @@ bool readBase64(std::string_view text, std::vector<std::byte>& out) {
   return true;
 }
 
-}  // namespace tavrel::plist
+}  // namespace tavrel

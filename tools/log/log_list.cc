@@ -1,0 +1,102 @@
+#include "tools/log/log_list.h"
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <set>
+
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "base/limits.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/plist/coding.h"
+#include "report/bh_report.h"
+#include "tools/log/filed_logs.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/quantity_text.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+// Metadata does not hold the day that a log reports.
+std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log) {
+  if (!log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName)) {
+    return std::nullopt;
+  }
+  const auto bytes =
+      context.linuxPlatform().fileSystem().read(log.path, limits::kPropertyListBytes);
+  const auto document = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(Error{});
+  return document ? dayOfLog(document->dictionary()) : std::nullopt;
+}
+
+// Nothing records whether a run was forced, but the gated one reports the day before its own.
+bool isSurelyForced(const FiledLog& log, std::optional<std::int32_t> day) {
+  const auto filed = log.metadata.date(kLogMetadataTime);
+  if (!day || !filed) return false;
+  const double filedDay =
+      std::floor(filed->secondsSince1970() / static_cast<double>(kSecondsPerDay));
+  return filedDay - 1 != static_cast<double>(*day);
+}
+
+}  // namespace
+
+void listLogs(ToolContext& context) {
+  const auto logs = filedLogs(context);
+  if (!logs) return context.fail(logs.error().message);
+  Table table({{"DAY", Table::Align::Whole},
+               {"RUN"},
+               {"SIZE", Table::Align::Right},
+               {"PLACE"},
+               {"FILE", Table::Align::Whole}});
+  Json entries = Json::array();
+  for (const FiledLog& log : *logs) {
+    const auto& status = log.status;
+    const auto day = readDay(context, log);
+    const bool isForced = isSurelyForced(log, day);
+    if (context.json()) {
+      Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
+      entry["bytes"] = status ? Json(status->st_size) : Json(nullptr);
+      entry["day"] = day ? Json(*day) : Json(nullptr);
+      entry["date"] = day ? Json(dayDateText(*day)) : Json(nullptr);
+      entry["forced"] = isForced ? Json(true) : Json(nullptr);
+      entries.push_back(std::move(entry));
+    } else {
+      table.add({day ? dayDateText(*day) : "-", isForced ? "forced" : "",
+                 status ? sizeText(static_cast<double>(status->st_size)) : "?",
+                 std::string(nameOf(log.place)), fileNameOf(log)});
+    }
+  }
+  if (context.json()) {
+    context.printJson({{"logs", std::move(entries)}});
+  } else if (table.empty()) {
+    context.out() << "no logs\n";
+  } else {
+    table.print(context.page());
+  }
+  noteMissingMetadata(context, *logs);
+}
+
+Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name) {
+  const LogEnvelope file{"file", name, {}};
+  if (name == "-" || name.empty() || name.find('/') != std::string::npos) return file;
+  const auto logs = filedLogs(context);
+  if (!logs) return file;
+  const FiledLog* found = nullptr;
+  std::set<std::string_view> names;
+  for (const FiledLog& log : *logs) {
+    if (!log.name.starts_with(name)) continue;
+    found = &log;
+    names.insert(log.name);
+  }
+  if (names.size() > 1) {
+    return Error{
+        format("%s is the beginning of %zu logs: give more of the name: 'tavrelctl log "
+               "list' shows them",
+               name, names.size())};
+  }
+  if (!found) return file;
+  return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
+}
+
+}  // namespace tavrel

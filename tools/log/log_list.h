@@ -1,0 +1,19 @@
+// The list of filed logs, and logs by the beginning of their names.
+#pragma once
+
+#include <string>
+
+#include "base/expected.h"
+#include "tools/log/log_document.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// Prints the logs of both folders, oldest first, with the day that each reports.
+void listLogs(ToolContext& context);
+
+/// The one filed log whose name begins with `name`; a file of this machine, "-" being standard
+/// input, when none does. The error says how many there are.
+Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name);
+
+}  // namespace tavrel

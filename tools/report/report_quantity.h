@@ -1,0 +1,26 @@
+// Values of channels in the units that people know.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// A figure in bytes, degrees Celsius ("°C") or an SI unit without a prefix.
+struct ConvertedValue {
+  double value;
+  std::string_view unit;
+};
+
+/// What `value` is in the unit of its channel. Nothing for counts and for units that cannot be
+/// converted.
+std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, std::int64_t value);
+
+/// "309.7 GiB", "41.3 °C", "12.5 ms".
+std::string textOf(const ConvertedValue& converted);
+
+}  // namespace tavrel
