@@ -102,10 +102,8 @@ void list(ToolContext& context, const Arguments& arguments) {
     addChannels(list, *channels);
     return list.end();
   }
-  if (IOReportGetChannelCount(*channels) == 0) {
-    if (!noting.hasErrors() && !noting.hasPrinted()) context.out() << "no channels\n";
-    return;
-  }
+  const bool hasComplained = noting.hasErrors() || noting.hasPrinted();
+  if (IOReportGetChannelCount(*channels) == 0 && hasComplained) return;
   printChannels(context.page(), *channels, arguments.flat);
 }
 
