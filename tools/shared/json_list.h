@@ -9,6 +9,7 @@
 #include <iosfwd>
 #include <string_view>
 
+#include "tools/shared/json_writer.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {
@@ -22,8 +23,10 @@ class JsonList {
   JsonList(std::ostream& out, Json head, std::string_view name, Layout layout = Layout::Document);
 
   void add(const Json& element);
-  /// An element that is JSON already and has no line ends; it is printed as it is.
+  /// An element that is JSON already; it is printed as it is.
   void addText(std::string_view json);
+  /// Writes elements for `addText` with the indentation that they have in the list.
+  JsonWriter elementWriter() const;
   /// Ends the list, the object and its line.
   void end();
 
