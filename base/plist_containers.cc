@@ -13,7 +13,7 @@ namespace detail {
 namespace {
 
 // Up to here a walk over the entries is as fast as a table, and smaller.
-constexpr std::size_t kLargestUnindexed = 8;
+constexpr std::size_t kLargestUnindexed = 16;
 
 std::uint32_t hashOf(std::string_view key) {
   return static_cast<std::uint32_t>(keyedHash(key));

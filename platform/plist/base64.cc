@@ -33,14 +33,16 @@ std::byte* putGroup(std::uint32_t group, std::byte* end) {
 
 // Takes the groups of four digits at the front of the text.
 std::byte* takeGroups(std::string_view& text, std::byte* end) {
-  while (text.size() >= 4) {
-    const auto value = [&text](std::size_t i) -> std::uint32_t {
-      return kValues[static_cast<unsigned char>(text[i])];
+  std::string_view rest = text;  // a copy, which the bytes that are written cannot overlap
+  while (rest.size() >= 4) {
+    const auto value = [rest](std::size_t i) -> std::uint32_t {
+      return kValues[static_cast<unsigned char>(rest[i])];
     };
     if (((value(0) | value(1) | value(2) | value(3)) & ~0x3FU) != 0) break;
     end = putGroup(value(0) << 18 | value(1) << 12 | value(2) << 6 | value(3), end);
-    text.remove_prefix(4);
+    rest.remove_prefix(4);
   }
+  text = rest;
   return end;
 }
 

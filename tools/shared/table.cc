@@ -47,6 +47,8 @@ std::string_view firstColumns(std::string_view text, std::size_t width) {
 }  // namespace
 
 std::string printable(std::string_view text) {
+  const auto isPlain = [](char character) { return character >= 0x20 && character < 0x7F; };
+  if (std::ranges::all_of(text, isPlain)) return std::string(text);
   std::string out;
   out.reserve(text.size());
   while (!text.empty()) {
@@ -118,22 +120,24 @@ void Table::print(std::ostream& out, std::optional<std::size_t> columns) const {
     }
   }
 
+  std::string line;
   const auto printRow = [&](const auto& cellOf) {
-    std::string line(indent_, ' ');
+    line.assign(indent_, ' ');
     for (std::size_t i = 0; i < columns_.size(); ++i) {
       const std::string& cell = cellOf(i);
-      std::string shown = cell;
-      if (columns && displayWidth(cell) > widths[i]) {
-        shown = firstColumns(cell, widths[i] - 1);
-        shown += "…";
-      }
-      const std::size_t width = displayWidth(shown);
-      const std::string padding(widths[i] > width ? widths[i] - width : 0, ' ');
+      std::size_t width = displayWidth(cell);
+      const bool isCut = columns && width > widths[i];
+      if (isCut) width = widths[i];
+      const std::size_t padding = widths[i] > width ? widths[i] - width : 0;
       if (i > 0) line += kGap;
-      line += columns_[i].align == Align::Right ? padding + shown : shown + padding;
+      if (columns_[i].align == Align::Right) line.append(padding, ' ');
+      line += isCut ? firstColumns(cell, widths[i] - 1) : std::string_view(cell);
+      if (isCut) line += "…";
+      if (columns_[i].align == Align::Left) line.append(padding, ' ');
     }
     line.erase(line.find_last_not_of(' ') + 1);
-    out << line << '\n';
+    line += '\n';
+    out << line;
   };
   if (hasTitles) printRow([&](std::size_t i) -> const std::string& { return columns_[i].title; });
   for (const auto& row : rows_) {
