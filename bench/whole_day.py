@@ -204,7 +204,7 @@ def flash_writes(devices, content):
             written.append(flash.written() - before)
             device.close()
     median = statistics.median(written)
-    print(f"  written to the device  {median:10,} bytes ({min(written):,} to {max(written):,}), "
+    print(f"  written to the device  {median:10,.0f} bytes ({min(written):,} to {max(written):,}), "
           f"{median / content:.2f} of the content")
 
 
@@ -229,7 +229,7 @@ def busy_day(devices):
           f"  content                {content + size:10,} bytes: {content:,} in files, {size:,} in "
           f"{rows:,} scalars")
     flash_writes(devices, content + size)
-    print(f"  written, by account    {written:10,} bytes, {written / (content + size):.2f} of the "
+    print(f"  written, by account    {written:10,.0f} bytes, {written / (content + size):.2f} of the "
           "content")
     if shutil.which("strace"):
         flushes(devices, BUSY)
