@@ -25,6 +25,27 @@ constexpr std::array<std::uint8_t, 256> kValues = [] {
   return values;
 }();
 
+std::byte* putGroup(std::uint32_t group, std::byte* end) {
+  for (const unsigned shift : {16U, 8U, 0U})
+    *end++ = static_cast<std::byte>(group >> shift);
+  return end;
+}
+
+// Takes the groups of four digits at the front of the text.
+std::byte* takeGroups(std::string_view& text, std::byte* end) {
+  std::string_view rest = text;  // a copy, which the bytes that are written cannot overlap
+  while (rest.size() >= 4) {
+    const auto value = [rest](std::size_t i) -> std::uint32_t {
+      return kValues[static_cast<unsigned char>(rest[i])];
+    };
+    if (((value(0) | value(1) | value(2) | value(3)) & ~0x3FU) != 0) break;
+    end = putGroup(value(0) << 18 | value(1) << 12 | value(2) << 6 | value(3), end);
+    rest.remove_prefix(4);
+  }
+  text = rest;
+  return end;
+}
+
 }  // namespace
 
 void appendBase64(std::string& out, ByteSpan bytes) {
@@ -44,13 +65,16 @@ void appendBase64(std::string& out, ByteSpan bytes) {
 }
 
 bool readBase64(std::string_view text, std::vector<std::byte>& out) {
-  out.clear();
-  out.reserve(text.size() / 4 * 3 + 3);
+  out.resize(text.size() / 4 * 3 + 3);
+  std::byte* end = out.data();
   std::uint32_t group = 0;
   unsigned digits = 0;   // of the group
   unsigned padding = 0;  // characters at the end
-  for (const char character : text) {
-    const std::uint8_t value = kValues[static_cast<unsigned char>(character)];
+  while (!text.empty()) {
+    if (digits == 0 && padding == 0) end = takeGroups(text, end);
+    if (text.empty()) break;
+    const std::uint8_t value = kValues[static_cast<unsigned char>(text.front())];
+    text.remove_prefix(1);
     if (value == kSpace) continue;
     if (value == kPadding) {
       ++padding;
@@ -59,16 +83,18 @@ bool readBase64(std::string_view text, std::vector<std::byte>& out) {
     if (value == kForeign || padding != 0) return false;
     group = group << 6 | value;
     if (++digits < 4) continue;
-    for (const unsigned shift : {16U, 8U, 0U})
-      out.push_back(static_cast<std::byte>(group >> shift));
+    end = putGroup(group, end);
     digits = 0;
     group = 0;
   }
-  if (digits == 0) return padding == 0;
-  if (digits == 1 || digits + padding != 4) return false;
-  group <<= 6 * padding;
-  out.push_back(static_cast<std::byte>(group >> 16));
-  if (padding == 1) out.push_back(static_cast<std::byte>(group >> 8));
+  if (digits != 0) {
+    if (digits == 1 || digits + padding != 4) return false;
+    putGroup(group << 6 * padding, end);
+    end += digits - 1;
+  } else if (padding != 0) {
+    return false;
+  }
+  out.resize(static_cast<std::size_t>(end - out.data()));
   return true;
 }
 

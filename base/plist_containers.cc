@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <bit>
 #include <cstring>
 #include <new>
 
@@ -12,7 +13,15 @@ namespace detail {
 namespace {
 
 // Up to here a walk over the entries is as fast as a table, and smaller.
-constexpr std::size_t kLargestUnindexed = 8;
+constexpr std::size_t kLargestUnindexed = 16;
+
+std::uint32_t hashOf(std::string_view key) {
+  return static_cast<std::uint32_t>(keyedHash(key));
+}
+
+std::size_t slotsFor(std::size_t entries) {
+  return std::bit_ceil(entries * 4);
+}
 
 }  // namespace
 
@@ -39,15 +48,20 @@ void destroy(Shared* object) {
 }
 
 Entry* DictionaryRep::find(std::string_view key) {
-  if (slots.empty()) {
+  return find(key, slots_.empty() ? 0 : hashOf(key));
+}
+
+Entry* DictionaryRep::find(std::string_view key, std::uint32_t hash) {
+  if (slots_.empty()) {
     const auto at = std::find_if(entries.begin(), entries.end(), [&](const Entry& entry) {
       return !entry.value.isNull() && entry.key == key;
     });
     return at == entries.end() ? nullptr : &*at;
   }
-  const std::size_t mask = slots.size() - 1;
-  for (std::size_t slot = keyedHash(key) & mask; slots[slot] != 0; slot = (slot + 1) & mask) {
-    Entry& entry = entries[slots[slot] - 1];
+  const std::size_t mask = slots_.size() - 1;
+  for (std::size_t i = hash & mask; slots_[i].entry != 0; i = (i + 1) & mask) {
+    if (slots_[i].hash != hash) continue;
+    Entry& entry = entries[slots_[i].entry - 1];
     if (!entry.value.isNull() && entry.key == key) return &entry;
   }
   return nullptr;
@@ -56,10 +70,14 @@ Entry* DictionaryRep::find(std::string_view key) {
 void DictionaryRep::set(std::string_view key, const String* sharedKey, Value value) {
   if (value.isNull()) {
     remove(key);
-  } else if (Entry* entry = find(key)) {
+    return;
+  }
+  const bool isIndexed = !slots_.empty() || entries.size() == kLargestUnindexed;
+  const std::uint32_t hash = isIndexed ? hashOf(key) : 0;
+  if (Entry* entry = find(key, hash)) {
     entry->value = std::move(value);
   } else {
-    append({sharedKey ? *sharedKey : String(key), std::move(value)});
+    append({sharedKey ? *sharedKey : String(key), std::move(value)}, hash);
   }
 }
 
@@ -68,39 +86,47 @@ bool DictionaryRep::remove(std::string_view key) {
   if (!entry) return false;
   entry->value = Value();
   ++removed;
-  if (removed * std::size_t{2} >= entries.size()) rebuild();
+  if (removed * std::size_t{2} >= entries.size()) compact();
   return true;
 }
 
-void DictionaryRep::append(Entry entry) {
+void DictionaryRep::append(Entry entry, std::uint32_t hash) {
   entries.push_back(std::move(entry));
   if (entries.size() <= kLargestUnindexed) return;
-  if (entries.size() * 2 > slots.size()) {
-    rebuild();
-  } else {
-    index(static_cast<std::uint32_t>(entries.size() - 1));
+  if (entries.size() * 2 > slots_.size()) grow();
+  place({hash, static_cast<std::uint32_t>(entries.size())});
+}
+
+// Drops the removed entries.
+void DictionaryRep::compact() {
+  std::erase_if(entries, [](const Entry& entry) { return entry.value.isNull(); });
+  removed = 0;
+  slots_.clear();
+  if (entries.size() <= kLargestUnindexed) return;
+  slots_.resize(slotsFor(entries.size()));
+  for (std::uint32_t i = 0; i < entries.size(); ++i)
+    place({hashOf(entries[i].key), i + 1});
+}
+
+// Makes room for the last entry, which is not placed yet, and as many as are reserved.
+void DictionaryRep::grow() {
+  std::vector<Slot> old(slotsFor(std::max(entries.size(), entries.capacity() / 2)));
+  old.swap(slots_);
+  if (old.empty()) {
+    for (std::uint32_t i = 0; i + 1 < entries.size(); ++i)
+      place({hashOf(entries[i].key), i + 1});
+  }
+  for (const Slot& slot : old) {
+    if (slot.entry != 0) place(slot);
   }
 }
 
-void DictionaryRep::rebuild() {
-  std::erase_if(entries, [](const Entry& entry) { return entry.value.isNull(); });
-  removed = 0;
-  slots.clear();
-  if (entries.size() <= kLargestUnindexed) return;
-  std::size_t size = kLargestUnindexed * 4;
-  while (size < entries.size() * 4)
-    size *= 2;
-  slots.resize(size);
-  for (std::uint32_t i = 0; i < entries.size(); ++i)
-    index(i);
-}
-
-void DictionaryRep::index(std::uint32_t entryNumber) {
-  const std::size_t mask = slots.size() - 1;
-  std::size_t slot = keyedHash(entries[entryNumber].key) & mask;
-  while (slots[slot] != 0)
-    slot = (slot + 1) & mask;
-  slots[slot] = entryNumber + 1;
+void DictionaryRep::place(Slot slot) {
+  const std::size_t mask = slots_.size() - 1;
+  std::size_t i = slot.hash & mask;
+  while (slots_[i].entry != 0)
+    i = (i + 1) & mask;
+  slots_[i] = slot;
 }
 
 }  // namespace detail

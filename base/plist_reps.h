@@ -27,8 +27,9 @@ struct ArrayRep : Shared {
 };
 
 /// Entries in the order of insertion. A removed entry stays, with a null value, until half of the
-/// entries are removed. Small dictionaries are searched from the front; larger ones have an
-/// open-addressing table of entry numbers.
+/// entries are removed ones. Small dictionaries are searched from the front; larger ones have an
+/// open-addressing table of entry numbers. The table keeps the keys' hashes, so that it grows
+/// without hashing them again and a look-up mostly compares one key.
 struct DictionaryRep : Shared {
   DictionaryRep() : Shared(Kind::Dictionary) {}
 
@@ -38,13 +39,21 @@ struct DictionaryRep : Shared {
   std::size_t size() const { return entries.size() - removed; }
 
   std::vector<Entry> entries;
-  std::vector<std::uint32_t> slots;  // entry number + 1, 0 for a free slot; a power of two
   std::uint32_t removed = 0;
 
  private:
-  void append(Entry entry);
-  void rebuild();
-  void index(std::uint32_t entryNumber);
+  struct Slot {
+    std::uint32_t hash;
+    std::uint32_t entry;  // its number + 1, 0 for a free slot
+  };
+
+  Entry* find(std::string_view key, std::uint32_t hash);
+  void append(Entry entry, std::uint32_t hash);
+  void compact();
+  void grow();
+  void place(Slot slot);
+
+  std::vector<Slot> slots_;  // a power of two
 };
 
 }  // namespace tavrel::plist::detail

@@ -1,11 +1,13 @@
 #!/usr/bin/env python3
-"""Times whole processes, beside the sqlite3 tool on the same data where it can do the same.
+"""Times whole processes, each in turn with its floor: what the libraries alone need for the data, or
+an empty program.
 
     bench/whole_runs.py BIN_DIRECTORY
 
-Each command runs several times; printed are the median CPU time (user and system), the peak memory
-and the ratio to the baseline. Times of the machine's other work do not count. Instructions are
-counted with valgrind, where it is installed.
+Each command runs several times; printed are the median CPU time (user and system) with the middle
+half of the runs, the peak memory and the ratio to the floor. Times of the machine's other work do
+not count. Instructions are counted with valgrind, where it is installed. The exit status is 1 when
+a wanted figure (bench/wanted.py) is missed.
 """
 
 import copy
@@ -20,6 +22,8 @@ import subprocess
 import sys
 import tempfile
 import time
+
+from wanted import Wanted
 
 RUNS = 15
 DAY = int(time.time() // 86400) - 1
@@ -37,10 +41,10 @@ class Device:
         self.tool("prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionEnabled", "true",
                   "--bool")
 
-    def copy(self):
-        """Another device with the same content."""
+    def copy(self, folder=None):
+        """Another device with the same content, below a folder of the caller's choice."""
         twin = copy.copy(self)
-        twin.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.")
+        twin.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.", dir=folder)
         twin.environment = {**self.environment, "TAVREL_ROOT": twin.root}
         shutil.copytree(self.root, twin.root, dirs_exist_ok=True)
         return twin
@@ -54,10 +58,10 @@ class Device:
 
     def whitelist(self, scalars=(), distributions=(), options=None):
         os.makedirs(os.path.dirname(self.path(WHITELIST)), exist_ok=True)
-        group = {"ScalarKeys": {key: {} for key in scalars},
+        group = {"ScalarKeys": {key: {"bucket_interval": 10} for key in scalars},
                  "DistributionKeys": {key: options or {} for key in distributions}}
         with open(self.path(WHITELIST), "wb") as file:
-            file.write(plistlib.dumps({"Group": group}, fmt=plistlib.FMT_BINARY))
+            file.write(plistlib.dumps({"Group": group}))
 
     def daemon(self, mode):
         return [os.path.join(self.bin, "tavrel"), mode]
@@ -88,15 +92,29 @@ def peak_mebibytes(command, environment):
         return int(file.read()) / 1024
 
 
-def measure(label, command, environment, baseline=None, runs=RUNS):
-    run_once(command, environment)
-    results = [run_once(command, environment) for _ in range(runs)]
-    cpu, wall = (statistics.median(column) for column in zip(*results))
+def summary(times):
+    """Median and quartiles in milliseconds."""
+    low, median, high = (value * 1e3 for value in statistics.quantiles(times, n=4))
+    return median, f"{median:8.2f} ms CPU ({low:.2f} to {high:.2f})"
+
+
+def measure(label, command, environment, floor=None, runs=RUNS):
+    """Median CPU milliseconds, their ratio to the floor (a label and a command), peak MiB."""
+    commands = [command] if floor is None else [command, floor[1]]
+    for each in commands:
+        run_once(each, environment)
+    times = list(zip(*([run_once(each, environment)[0] for each in commands] for _ in range(runs))))
     memory = peak_mebibytes(command, environment)
-    ratio = f"   ratio {cpu / baseline:6.2f}" if baseline else ""
-    print(f"  {label:<44} {cpu * 1e3:8.2f} ms CPU {wall * 1e3:8.2f} ms {memory:7.1f} MiB"
-          f"{ratio}")
-    return cpu
+    median, text = summary(times[0])
+    ratio = 0.0
+    line = f"  {label:<34} {text:<34} {memory:6.1f} MiB"
+    if floor is not None:
+        floor_median, floor_text = summary(times[1])
+        ratio = median / floor_median
+        line += f"   {ratio:.2f} x the floor"
+        print(f"  {floor[0]:<34} {floor_text}")
+    print(line, end="")
+    return median, ratio, memory
 
 
 def scalar_lines(count):
@@ -120,28 +138,37 @@ def import_rates(device):
         print(f"  {label:<44} {len(lines) / wall:12,.0f} lines/s")
 
 
-def daily_scalars(bin_directory):
-    print("\nA day of 2,000 scalars, half of them whitelisted, beside 1,000,000 values not asked for")
+def floor_of(device, *arguments):
+    return [os.path.join(device.bin, "tavrel_floor"), *arguments]
+
+
+def daily_scalars(bin_directory, wanted):
+    print("\nA day of 2,000 scalars, half of them whitelisted in XML with a bucket interval each, "
+          "beside 1,000,000 values not asked for")
     device = Device(bin_directory)
     device.tool("stat", "import", "-", text="".join(scalar_lines(2000) + value_lines(1000, 1000)))
     device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(0, 2000, 2)])
-    query = f"SELECT key, value FROM scalars WHERE day = {DAY}"
-    baseline = measure("sqlite3 reading the same scalars",
-                       ["sqlite3", "-readonly", device.path(STORE), query], device.environment)
-    measure("tavrel -f", device.daemon("-f"), device.environment, baseline)
+    whitelist = device.path(WHITELIST)
+    floor = floor_of(device, "xml", whitelist, "md5", whitelist, "scalars", device.path(STORE),
+                     str(DAY))
+    median, _, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
+                           ("Expat, MD5 and SQLite alone", floor), runs=40)
+    print(wanted.judge("2,000 scalars, ms", median))
     device.close()
 
 
-def nothing_to_do(bin_directory):
+def nothing_to_do(bin_directory, wanted):
     print("\nA gated run with nothing to do")
     device = Device(bin_directory)
     run_once(device.daemon("-d"), device.environment)
-    measure("tavrel -d", device.daemon("-d"), device.environment, runs=50)
-    measure("/bin/true", ["/bin/true"], device.environment, runs=50)
+    empty = [os.path.join(device.bin, "tavrel_empty")]
+    _, ratio, _ = measure("tavrel -d", device.daemon("-d"), device.environment,
+                          ("an empty program", empty), runs=200)
+    print(wanted.judge("nothing to do: ratio to an empty program", ratio))
     device.close()
 
 
-def distributions(bin_directory):
+def distributions(bin_directory, wanted):
     print("\n1,000 distributions of 1,000 values, all whitelisted with 20 boundaries each")
     device = Device(bin_directory)
     lines = value_lines(1000, 1000)
@@ -156,9 +183,9 @@ def distributions(bin_directory):
                    check=True)
     query = ("SELECT key, min(value), max(value), avg(value), count(*) FROM plain "
              f"WHERE day = {DAY} GROUP BY key")
-    baseline = measure("sqlite3, one row per value, covering index", ["sqlite3", table, query],
-                       device.environment, runs=7)
-    measure("tavrel -f", device.daemon("-f"), device.environment, baseline, runs=7)
+    median, _, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
+                           ("sqlite3, a row per value, indexed", ["sqlite3", table, query]))
+    print(wanted.judge("1,000 distributions, ms", median))
     device.close()
 
 
@@ -198,26 +225,31 @@ def channels_shown(command, environment):
     return len(set(re.findall(r"channel \d+ of driver \d+", output)))
 
 
-def report_samples(bin_directory):
+def report_samples(bin_directory, wanted):
     count = 10_000
-    print(f"\ntavrelctl report sample --count 1, {count:,} channels "
-          "(wanted: <= 100 ms, < 64 MiB)")
-    for label, formats in (("simple", [SIMPLE]), ("all formats", list(ELEMENTS))):
-        recording = report_channels(count, formats)
-        for encoding, form in (("binary", plistlib.FMT_BINARY), ("XML", plistlib.FMT_XML)):
-            device = Device(bin_directory)
-            path = device.path("var/lib/tavrel/registry/report.plist")
-            os.makedirs(os.path.dirname(path))
-            with open(path, "wb") as file:
-                file.write(plistlib.dumps(recording, fmt=form))
-            for options in ([], ["--json"]):
-                command = [os.path.join(device.bin, "tavrelctl"), "report", "sample", "--count",
-                           "1", *options]
-                shown = channels_shown(command, device.environment)
-                if shown != count:
-                    raise SystemExit(f"report sample showed {shown} of {count} channels")
-                measure(" ".join([label, encoding, *options]), command, device.environment)
-            device.close()
+    print(f"\ntavrelctl report sample --count 1, {count:,} channels of all formats")
+    recording = report_channels(count, list(ELEMENTS))
+    for encoding, form in (("binary", plistlib.FMT_BINARY), ("XML", plistlib.FMT_XML)):
+        device = Device(bin_directory)
+        path = device.path("var/lib/tavrel/registry/report.plist")
+        os.makedirs(os.path.dirname(path))
+        with open(path, "wb") as file:
+            file.write(plistlib.dumps(recording, fmt=form))
+        floor = None
+        if form == plistlib.FMT_XML:
+            floor = ("Expat alone", floor_of(device, "xml", path))
+        for options in ([], ["--json"], ["--delta"], ["--json", "--delta"]):
+            command = [os.path.join(device.bin, "tavrelctl"), "report", "sample", "--count", "1",
+                       "--interval", "0", *options]
+            shown = channels_shown(command, device.environment)
+            if shown != count:
+                raise SystemExit(f"report sample showed {shown} of {count} channels")
+            median, _, memory = measure(" ".join([encoding, *options]), command,
+                                        device.environment, floor)
+            floor = None
+            print(wanted.judge("report sample of 10,000 channels, ms", median), end="")
+            print(wanted.judge("report sample of 10,000 channels, MiB", memory))
+        device.close()
 
 
 def growth(bin_directory):
@@ -248,14 +280,16 @@ def growth(bin_directory):
 
 def main():
     bin_directory = sys.argv[1]
+    wanted = Wanted()
     device = Device(bin_directory)
     import_rates(device)
     device.close()
-    daily_scalars(bin_directory)
-    nothing_to_do(bin_directory)
-    distributions(bin_directory)
-    report_samples(bin_directory)
+    daily_scalars(bin_directory, wanted)
+    nothing_to_do(bin_directory, wanted)
+    distributions(bin_directory, wanted)
+    report_samples(bin_directory, wanted)
     growth(bin_directory)
+    sys.exit(wanted.status())
 
 
 if __name__ == "__main__":

@@ -15,6 +15,7 @@
 #include "base/plist.h"
 #include "config/bh_config.h"
 #include "platform/platform.h"
+#include "report/histogram.h"
 #include "report/log_outcome.h"
 
 namespace tavrel {
@@ -82,6 +83,7 @@ class BHReport {
 
   Platform& platform_;
   std::unique_ptr<BHConfig> _config;
+  HistogramLabels histogramLabels_;
   plist::Dictionary _scalarsOutput = plist::Dictionary::create();
   plist::Dictionary _distributionsOutput = plist::Dictionary::create();
   plist::Dictionary _histogramsOutput = plist::Dictionary::create();

@@ -79,7 +79,8 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
   if (values.failed()) return;
 
   if (histogram) {
-    _histogramsOutput.set(forKey, histogramDictForIntervals(intervals, histogram->counts()));
+    _histogramsOutput.set(
+        forKey, histogramDictForIntervals(intervals, histogram->counts(), histogramLabels_));
   }
   _distributionsOutput.set(forKey, summary.numbers());
 }

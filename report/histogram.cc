@@ -1,5 +1,7 @@
 #include "report/histogram.h"
 
+#include <algorithm>
+#include <bit>
 #include <limits>
 #include <new>
 
@@ -18,6 +20,14 @@ double boundaryOf(const plist::Value& value) {
   return number ? number->real() : kNotANumber;
 }
 
+// Whether labels show both in the same way; false when it is not known.
+bool printAlike(const plist::Value& a, const plist::Value& b) {
+  const auto left = a.number();
+  const auto right = b.number();
+  return left && right && left->kind() == right->kind() && left->int64() == right->int64() &&
+         std::bit_cast<std::uint64_t>(left->real()) == std::bit_cast<std::uint64_t>(right->real());
+}
+
 }  // namespace
 
 std::uint32_t determineHistBucketForValue(double value, const plist::Array& withIntervals) {
@@ -29,19 +39,42 @@ std::uint32_t determineHistBucketForValue(double value, const plist::Array& with
   return index;
 }
 
+void HistogramLabels::choose(const plist::Array& intervals) {
+  if (intervals_ && std::ranges::equal(intervals_, intervals, printAlike)) return;
+  labels_.assign(intervals.size() + 1, {});
+  intervals_ = plist::mutableCopy(intervals);
+}
+
+const plist::String& HistogramLabels::of(std::size_t bucket) {
+  plist::String& label = labels_[bucket];
+  if (!label.view().empty()) return label;
+  const plist::Value lower = bucket == 0 ? plist::Value(-kInfinity) : intervals_.at(bucket - 1);
+  label = bucket == intervals_.size() ? format("(%@, %@)", lower, plist::Value(kInfinity))
+                                      : format("(%@, %@]", lower, intervals_.at(bucket));
+  return label;
+}
+
 plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
-                                            std::span<const std::uint32_t> withHistCounts) {
+                                            std::span<const std::uint32_t> withHistCounts,
+                                            HistogramLabels& labels) {
   const std::size_t boundaries = intervals.size();
   if (boundaries >= std::numeric_limits<std::uint32_t>::max()) return {};
-  plist::Dictionary histogram;
+  labels.choose(intervals);
+  const auto counts = withHistCounts.first(boundaries + 1);
+  const auto counted = static_cast<std::size_t>(
+      std::ranges::count_if(counts, [](auto count) { return count != 0; }));
+  if (counted == 0) return {};
+  plist::Dictionary histogram = plist::Dictionary::create(counted);
   for (std::size_t i = 0; i <= boundaries; ++i) {
-    if (withHistCounts[i] == 0) continue;
-    const plist::Value lower = i == 0 ? plist::Value(-kInfinity) : intervals.at(i - 1);
-    const std::string label = i == boundaries ? format("(%@, %@)", lower, plist::Value(kInfinity))
-                                              : format("(%@, %@]", lower, intervals.at(i));
-    histogram.set(label, withHistCounts[i]);
+    if (counts[i] != 0) histogram.set(labels.of(i), counts[i]);
   }
   return histogram;
+}
+
+plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
+                                            std::span<const std::uint32_t> withHistCounts) {
+  HistogramLabels labels;
+  return histogramDictForIntervals(intervals, withHistCounts, labels);
 }
 
 std::optional<Histogram> Histogram::create(const plist::Array& intervals) {
@@ -49,8 +82,8 @@ std::optional<Histogram> Histogram::create(const plist::Array& intervals) {
   Histogram histogram;
   try {
     histogram.counts_.resize(intervals.size() + 1);
-    histogram.ends_.reserve(intervals.size());
-    histogram.indexes_.reserve(intervals.size() + 1);
+    histogram.ends_.reserve(std::bit_ceil(intervals.size() + 1));
+    histogram.indexes_.reserve(std::bit_ceil(intervals.size() + 1));
   } catch (const std::bad_alloc&) {
     return std::nullopt;
   }
@@ -65,23 +98,10 @@ std::optional<Histogram> Histogram::create(const plist::Array& intervals) {
     }
     ++index;
   }
-  histogram.indexes_.push_back(index);
+  const std::size_t room = std::bit_ceil(histogram.ends_.size() + 1);
+  histogram.indexes_.resize(room, index);
+  histogram.ends_.resize(room - 1, kInfinity);
   return histogram;
-}
-
-// Halving without branches: a CPU cannot predict the order of values. The comparisons are written
-// so that not-a-number passes every boundary.
-std::uint32_t Histogram::bucketOf(double value) const {
-  const double* first = ends_.data();
-  std::size_t count = ends_.size();
-  while (count > 1) {
-    const std::size_t half = count / 2;
-    first = first[half - 1] >= value ? first : first + half;
-    count -= half;
-  }
-  auto passed = static_cast<std::size_t>(first - ends_.data());
-  if (count == 1 && !(*first >= value)) ++passed;
-  return indexes_[passed];
 }
 
 }  // namespace tavrel

@@ -18,7 +18,23 @@ namespace tavrel {
 /// The index of the bucket of `value`, by a walk over boundaries in the order of the whitelist.
 std::uint32_t determineHistBucketForValue(double value, const plist::Array& withIntervals);
 
+/// The labels of buckets. Rows that follow one another mostly have the same boundaries, so the
+/// labels of the boundaries that were last chosen are kept, and only those.
+class HistogramLabels {
+ public:
+  void choose(const plist::Array& intervals);
+  /// The label of a bucket of the chosen boundaries, made when it is first asked for.
+  const plist::String& of(std::size_t bucket);
+
+ private:
+  plist::Array intervals_;  // a copy: the caller's may change
+  std::vector<plist::String> labels_;
+};
+
 /// Labels and counts of the buckets that counted something; an empty handle when none did.
+plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
+                                            std::span<const std::uint32_t> withHistCounts,
+                                            HistogramLabels& labels);
 plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
                                             std::span<const std::uint32_t> withHistCounts);
 
@@ -32,15 +48,25 @@ class Histogram {
   void count(double value) { ++counts_[bucketOf(value)]; }
   std::span<const std::uint32_t> counts() const { return counts_; }
 
-  /// The index that `determineHistBucketForValue` gives.
-  std::uint32_t bucketOf(double value) const;
+  /// The same index as `determineHistBucketForValue` gives.
+  std::uint32_t bucketOf(double value) const {
+    // Halving without branches: values come in no order that a CPU could predict. The comparison
+    // is written so that not-a-number passes every boundary.
+    const double* const ends = ends_.data();
+    std::size_t passed = 0;
+    for (std::size_t step = indexes_.size() / 2; step != 0; step /= 2)
+      passed += ends[passed + step - 1] >= value ? 0 : step;
+    return indexes_[passed];
+  }
 
  private:
   Histogram() = default;
 
-  // The boundaries that can decide: those above all boundaries before them. They ascend, so that a
-  // search by halving finds the one at which the walk stops. `indexes_` has the position of each in
-  // the whitelist, and last the index of the bucket above all.
+  // The boundaries that can decide: those above all boundaries before them. They ascend, so that
+  // a search by halving finds the one at which the walk stops. With each its index in the
+  // whitelist's order, and last the index of the bucket above them all. The last index and an
+  // infinite boundary, which only not-a-number passes, are repeated until the indexes are a power
+  // of two.
   std::vector<double> ends_;
   std::vector<std::uint32_t> indexes_;
   std::vector<std::uint32_t> counts_;

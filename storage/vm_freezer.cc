@@ -11,7 +11,7 @@ namespace {
 
 constexpr std::string_view kFreezerThread = "VM_swapout";
 
-constexpr std::size_t kHeaderBytes = 16;
+constexpr std::size_t kItemHeaderBytes = 16;
 constexpr std::size_t kContainerKindBytes = 4;
 constexpr std::size_t kLongestName = 64;
 constexpr std::uint64_t kPhysicalWrites = 24;  // in the IO statistics
@@ -30,8 +30,8 @@ struct Item {
 
 // The first of `items`, or nothing when it is truncated.
 std::optional<Item> frontItem(ByteSpan items) {
-  if (items.size() < kHeaderBytes) return std::nullopt;
-  const auto payload = slice(items, kHeaderBytes, *loadLittle32(items, 4));
+  if (items.size() < kItemHeaderBytes) return std::nullopt;
+  const auto payload = slice(items, kItemHeaderBytes, *loadLittle32(items, 4));
   if (!payload) return std::nullopt;
   return Item{*loadLittle32(items, 0), *loadLittle64(items, 8), *payload};
 }
@@ -116,7 +116,7 @@ bool getIOStatsWithThreadnameFromKCDataHelper(ByteSpan items,
     } else if (!levels.empty() && item->type == kIOStatistics) {
       levels.top().statistics = item->payload;
     }
-    rest = rest.subspan(kHeaderBytes + item->payload.size());
+    rest = rest.subspan(kItemHeaderBytes + item->payload.size());
   }
 }
 

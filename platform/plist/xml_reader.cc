@@ -22,8 +22,6 @@
 namespace tavrel::plist {
 namespace {
 
-constexpr std::string_view kSpace = " \t\r\n";
-
 // Those from Key to Data hold text.
 enum class Element : std::uint8_t {
   None,
@@ -40,35 +38,69 @@ enum class Element : std::uint8_t {
   False
 };
 
-constexpr std::array<std::pair<std::string_view, Element>, 11> kElements{{
-    {"plist", Element::Plist},
-    {"dict", Element::Dict},
-    {"array", Element::Array},
-    {"key", Element::Key},
-    {"string", Element::String},
-    {"integer", Element::Integer},
-    {"real", Element::Real},
-    {"date", Element::Date},
-    {"data", Element::Data},
-    {"true", Element::True},
-    {"false", Element::False},
-}};
-
+// Every element begins and ends with a call: the first letter decides which name is compared.
 Element elementNamed(std::string_view name) {
-  for (const auto& [elementName, element] : kElements) {
-    if (elementName == name) return element;
+  const auto either = [name](std::string_view one, Element oneElement, std::string_view other = {},
+                             Element otherElement = Element::None) {
+    return name == one ? oneElement : name == other ? otherElement : Element::None;
+  };
+  switch (name.empty() ? '\0' : name.front()) {
+    case 'p':
+      return either("plist", Element::Plist);
+    case 'd':
+      if (name.size() == 4 && name[1] == 'a') {
+        return either("data", Element::Data, "date", Element::Date);
+      }
+      return either("dict", Element::Dict);
+    case 'a':
+      return either("array", Element::Array);
+    case 'k':
+      return either("key", Element::Key);
+    case 's':
+      return either("string", Element::String);
+    case 'i':
+      return either("integer", Element::Integer);
+    case 'r':
+      return either("real", Element::Real);
+    case 't':
+      return either("true", Element::True);
+    case 'f':
+      return either("false", Element::False);
+    default:
+      return Element::None;
   }
-  return Element::None;
+}
+
+bool isSpace(char character) {
+  return character == ' ' || character == '\t' || character == '\n' || character == '\r';
 }
 
 std::string_view trimmed(std::string_view text) {
-  const std::size_t first = text.find_first_not_of(kSpace);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(kSpace) - first + 1);
+  while (!text.empty() && isSpace(text.front()))
+    text.remove_prefix(1);
+  while (!text.empty() && isSpace(text.back()))
+    text.remove_suffix(1);
+  return text;
 }
 
-// Turns Expat's events into values as they come. Elements of containers wait on one stack, so that
-// a container is made once, with exactly the room for its elements.
+/// Shares the text of keys that come again: the dictionaries of a list mostly have the same keys.
+class KeyTexts {
+ public:
+  String of(std::string_view text) {
+    if (text.empty()) return {};
+    const std::size_t place = text.size() * 7 + static_cast<unsigned char>(text.front()) * 5U +
+                              static_cast<unsigned char>(text.back());
+    String& known = known_[place % known_.size()];
+    if (known != text) known = String(text);
+    return known;
+  }
+
+ private:
+  std::array<String, 64> known_;
+};
+
+// Turns Expat's events into values as they come. What a container holds is gathered on one stack,
+// so that a container is made once, with room for just its elements.
 class XmlReader {
  public:
   Expected<Value> read(ByteSpan bytes);
@@ -118,6 +150,7 @@ class XmlReader {
   bool insidePlist_ = false;
   Element scalar_ = Element::None;  // the element whose text is being gathered
   std::string text_;
+  KeyTexts keys_;
   std::vector<std::byte> data_;
   std::vector<Container> containers_;
   std::vector<Entry> entries_;  // the elements of arrays have empty keys
@@ -244,7 +277,7 @@ void XmlReader::endElement() {
 void XmlReader::endScalar() {
   switch (std::exchange(scalar_, Element::None)) {
     case Element::Key:
-      entries_.push_back({text_, Value()});
+      entries_.push_back({keys_.of(text_), Value()});
       containers_.back().hasKey = true;
       return;
     case Element::String:
@@ -304,7 +337,7 @@ void XmlReader::add(Value value) {
 void XmlReader::characters(std::string_view text) {
   if (scalar_ >= Element::Key && scalar_ <= Element::Data) {
     text_.append(text);
-  } else if (text.find_first_not_of(kSpace) != std::string_view::npos) {
+  } else if (!std::ranges::all_of(text, isSpace)) {
     fail("text stands outside an element that holds text");
   }
 }

@@ -58,6 +58,16 @@ TEST(HistogramTest, LabelsTheBucketsThatCounted) {
             (Dictionary{{"(-inf, 10]", 2}, {"(12.5, 1e+300]", 1}, {"(1e+300, inf)", 4294967295}}));
   const std::uint32_t kOne[] = {3};
   EXPECT_EQ(histogramDictForIntervals(plist::Array{}, kOne), (Dictionary{{"(-inf, inf)", 3}}));
+  // Labels that are kept from other boundaries, equal in value only, are not given for these.
+  HistogramLabels labels;
+  const std::uint32_t kBoth[] = {1, 1};
+  for (const auto& [boundary, text] : {std::pair<plist::Value, const char*>{1, "(-inf, 1]"},
+                                       {0, "(-inf, 0]"},
+                                       {-0.0, "(-inf, -0]"},
+                                       {"0", "(-inf, 0]"},
+                                       {"x", "(-inf, x]"}})
+    EXPECT_TRUE(histogramDictForIntervals(plist::Array{boundary}, kBoth, labels).contains(text))
+        << text;
   const std::uint32_t kNone[] = {0, 0};
   EXPECT_FALSE(histogramDictForIntervals(plist::Array{1}, kNone));
 }

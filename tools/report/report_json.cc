@@ -1,8 +1,7 @@
 #include "tools/report/report_json.h"
 
-#include <cmath>
-#include <nlohmann/json.hpp>
-#include <utility>
+#include <optional>
+#include <string_view>
 
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
@@ -13,125 +12,168 @@
 namespace tavrel {
 namespace {
 
-Json orNull(std::optional<std::string_view> text) {
-  return text ? Json(*text) : Json();
+void textOrNull(JsonWriter& json, std::optional<std::string_view> text) {
+  if (text) return json.text(*text);
+  json.null();
 }
-Json orNull(std::int64_t value) {
-  return value == kInvalidValue ? Json() : Json(value);
+void valueOrNull(JsonWriter& json, std::int64_t value) {
+  if (value == kInvalidValue) return json.null();
+  json.integer(value);
 }
-Json idOrNull(std::int64_t id) {
-  return id == kInvalidValue ? Json() : Json(static_cast<std::uint64_t>(id));
+void wordOrNull(JsonWriter& json, std::int64_t word) {
+  if (word == kInvalidValue) return json.null();
+  json.integer(static_cast<std::uint64_t>(word));
 }
-Json countOrNull(std::int64_t count, bool isDelta) {
-  return isDelta ? orNull(count) : idOrNull(count);
+// Counts are unsigned, but for their differences.
+void countOrNull(JsonWriter& json, std::int64_t count, bool isDelta) {
+  if (isDelta) return valueOrNull(json, count);
+  wordOrNull(json, count);
+}
+// Of bounds every word is one.
+void boundOrNull(JsonWriter& json, std::int64_t bound, bool hasBounds) {
+  if (hasBounds) return json.integer(static_cast<std::uint64_t>(bound));
+  json.null();
 }
 
-Json channelJson(const plist::Dictionary& channel) {
+void writeChannel(JsonWriter& json, const plist::Dictionary& channel) {
   std::uint64_t type = 0;
   const bool hasType = getChannelType(channel, type) == kKernelSuccess;
-  return {{"driver", orNull(IOReportChannelGetDriverName(channel))},
-          {"driver_id", idOrNull(IOReportChannelGetDriverID(channel))},
-          {"group", orNull(IOReportChannelGetGroup(channel))},
-          {"subgroup", orNull(IOReportChannelGetSubGroup(channel))},
-          {"name", orNull(IOReportChannelGetChannelName(channel))},
-          {"id", idOrNull(IOReportChannelGetChannelID(channel))},
-          {"format", formatName(IOReportChannelGetFormat(channel))},
-          {"categories", hasType ? Json(categoriesOf(type)) : Json()},
-          {"elements", hasType ? Json(elementCountOf(type)) : Json()},
-          {"unit", idOrNull(IOReportChannelGetUnit(channel))},
-          {"unit_label", orNull(IOReportChannelGetUnitLabel(channel))}};
+  textOrNull(json.member("driver"), IOReportChannelGetDriverName(channel));
+  wordOrNull(json.member("driver_id"), IOReportChannelGetDriverID(channel));
+  textOrNull(json.member("group"), IOReportChannelGetGroup(channel));
+  textOrNull(json.member("subgroup"), IOReportChannelGetSubGroup(channel));
+  textOrNull(json.member("name"), IOReportChannelGetChannelName(channel));
+  wordOrNull(json.member("id"), IOReportChannelGetChannelID(channel));
+  json.member("format").text(formatName(hasType ? formatOf(type) : kFormatUnknown));
+  wordOrNull(json.member("categories"), hasType ? categoriesOf(type) : kInvalidValue);
+  wordOrNull(json.member("elements"), hasType ? elementCountOf(type) : kInvalidValue);
+  wordOrNull(json.member("unit"), IOReportChannelGetUnit(channel));
+  textOrNull(json.member("unit_label"), IOReportChannelGetUnitLabel(channel));
 }
 
-Json convertedJson(const plist::Dictionary& channel, std::int64_t value) {
+void writeConverted(JsonWriter& json, const plist::Dictionary& channel, std::int64_t value) {
   const auto converted = convertedValue(channel, value);
-  return converted ? Json({{"value", converted->value}, {"unit", converted->unit}}) : Json();
+  if (!converted) return json.null();
+  json.beginObject();
+  json.member("value").real(converted->value);
+  json.member("unit").text(converted->unit);
+  json.endObject();
 }
 
-Json statesJson(const plist::Dictionary& channel, bool isDelta) {
-  Json states = Json::array();
+void writeStates(JsonWriter& json, const plist::Dictionary& channel, bool isDelta) {
+  json.beginArray();
   const std::int32_t current = IOReportStateGetCurrent(channel);
+  const std::int32_t count = IOReportStateGetCount(channel);
   const Elements elements = elementsOfType(channel, kFormatState);
   const plist::Array names = stateNames(channel);
   const std::uint64_t total = totalResidency(elements);
-  for (std::int32_t state = 0; state < IOReportStateGetCount(channel); ++state) {
+  for (std::int32_t state = 0; state < count; ++state) {
     const auto i = static_cast<std::size_t>(state);
     const double duty = dutyCycle(elements, i, total);
+    json.element().beginObject();
+    wordOrNull(json.member("id"), elements.value(i, kStateID));
+    textOrNull(json.member("name"), names.at(i).string());
+    countOrNull(json.member("in_transitions"), elements.value(i, kStateInTransitions), isDelta);
     const std::int64_t residency = elements.value(i, kStateResidency);
-    states.push_back(
-        {{"id", idOrNull(elements.value(i, kStateID))},
-         {"name", orNull(names.at(i).string())},
-         {"in_transitions", countOrNull(elements.value(i, kStateInTransitions), isDelta)},
-         {"residency", countOrNull(residency, isDelta)},
-         {"converted", residency < 0 ? Json() : convertedJson(channel, residency)},
-         {"duty_cycle", std::isnan(duty) ? Json() : Json(duty)},
-         {"current", state == current}});
+    countOrNull(json.member("residency"), residency, isDelta);
+    // A negative one is none.
+    writeConverted(json.member("converted"), channel, residency < 0 ? kInvalidValue : residency);
+    json.member("duty_cycle").real(duty);
+    json.member("current").boolean(state == current);
+    json.endObject();
   }
-  return states;
+  json.endArray();
 }
 
-Json bucketMean(std::int64_t hits, std::int64_t sum) {
-  if (hits <= 0 || sum == kInvalidValue) return nullptr;
-  return static_cast<double>(sum) / static_cast<double>(hits);
+void writeMean(JsonWriter& json, std::int64_t hits, std::int64_t sum) {
+  if (hits <= 0 || sum == kInvalidValue) return json.null();
+  json.real(static_cast<double>(sum) / static_cast<double>(hits));
 }
 
-Json bucketsJson(const plist::Dictionary& channel, bool isDelta) {
-  Json buckets = Json::array();
+void writeBuckets(JsonWriter& json, const plist::Dictionary& channel, bool isDelta) {
+  json.beginArray();
+  const std::int32_t count = IOReportHistogramGetBucketCount(channel);
+  const Elements elements = elementsOfType(channel, kFormatHistogram);
   bool hasBounds = true;
-  for (std::int32_t i = 0; i < IOReportHistogramGetBucketCount(channel); ++i) {
+  for (std::int32_t bucket = 0; bucket < count; ++bucket) {
+    const auto i = static_cast<std::size_t>(bucket);
     std::int64_t lower = 0;
     std::int64_t upper = 0;
-    hasBounds =
-        hasBounds && IOReportHistogramGetBucketBounds(channel, i, &lower, &upper) == kKernelSuccess;
-    const std::int64_t hits = IOReportHistogramGetBucketHits(channel, i);
-    const std::int64_t sum = IOReportHistogramGetBucketSum(channel, i);
-    buckets.push_back({{"lower", hasBounds ? Json(static_cast<std::uint64_t>(lower)) : Json()},
-                       {"upper", hasBounds ? Json(static_cast<std::uint64_t>(upper)) : Json()},
-                       {"hits", countOrNull(hits, isDelta)},
-                       {"minimum", orNull(IOReportHistogramGetBucketMinValue(channel, i))},
-                       {"maximum", orNull(IOReportHistogramGetBucketMaxValue(channel, i))},
-                       {"sum", orNull(sum)},
-                       {"mean", bucketMean(hits, sum)}});
+    hasBounds = hasBounds &&
+                IOReportHistogramGetBucketBounds(channel, bucket, &lower, &upper) == kKernelSuccess;
+    json.element().beginObject();
+    boundOrNull(json.member("lower"), lower, hasBounds);
+    boundOrNull(json.member("upper"), upper, hasBounds);
+    const std::int64_t hits = elements.value(i, kBucketHits);
+    const std::int64_t sum = elements.value(i, kBucketSum);
+    countOrNull(json.member("hits"), hits, isDelta);
+    valueOrNull(json.member("minimum"), elements.value(i, kBucketMinimum));
+    valueOrNull(json.member("maximum"), elements.value(i, kBucketMaximum));
+    valueOrNull(json.member("sum"), sum);
+    writeMean(json.member("mean"), hits, sum);
+    json.endObject();
   }
-  return buckets;
+  json.endArray();
 }
 
-Json arrayJson(const plist::Dictionary& channel) {
-  Json values = Json::array();
-  const auto count = static_cast<std::int32_t>(kElementValues *
-                                               getRawElements(channel, kFormatSimpleArray).count());
-  for (std::int32_t i = 0; i < count; ++i)
-    values.push_back(orNull(IOReportArrayGetValueAtIndex(channel, i)));
-  return values;
+void writeArray(JsonWriter& json, const plist::Dictionary& channel) {
+  json.beginArray();
+  const Elements elements = elementsOfType(channel, kFormatSimpleArray);
+  const std::size_t count = getRawElements(channel, kFormatSimpleArray).count();
+  for (std::size_t element = 0; element < count; ++element) {
+    for (std::size_t i = 0; i < kElementValues; ++i)
+      valueOrNull(json.element(), elements.value(element, i));
+  }
+  json.endArray();
 }
 
-Json sampleJson(const plist::Dictionary& channel, bool isDelta) {
-  Json json = channelJson(channel);
+void writeSample(JsonWriter& json, const plist::Dictionary& channel, bool isDelta) {
+  writeChannel(json, channel);
   const std::uint8_t form = IOReportChannelGetFormat(channel);
   const Elements elements = getRawElements(channel, form);
+  json.member("timestamp");
   // The delta of a simple channel keeps the earlier time, which says nothing about it.
-  const bool hasTime = elements && !(isDelta && form == kFormatSimple);
-  json["timestamp"] = hasTime ? Json(elements.timestamp(0)) : Json();
+  if (elements && !(isDelta && form == kFormatSimple)) {
+    json.integer(elements.timestamp(0));
+  } else {
+    json.null();
+  }
   if (form == kFormatSimple) {
     const std::int64_t value = IOReportSimpleGetIntegerValue(channel);
-    json["value"] = orNull(value);
-    json["converted"] = convertedJson(channel, value);
+    valueOrNull(json.member("value"), value);
+    writeConverted(json.member("converted"), channel, value);
+  } else if (form == kFormatState) {
+    writeStates(json.member("states"), channel, isDelta);
+  } else if (form == kFormatHistogram) {
+    writeBuckets(json.member("buckets"), channel, isDelta);
+  } else if (form == kFormatSimpleArray) {
+    writeArray(json.member("values"), channel);
   }
-  if (form == kFormatState) json["states"] = statesJson(channel, isDelta);
-  if (form == kFormatHistogram) json["buckets"] = bucketsJson(channel, isDelta);
-  if (form == kFormatSimpleArray) json["values"] = arrayJson(channel);
-  return json;
+}
+
+// One writer for all, so that its buffer is used again.
+template <class Write>
+void addEach(JsonList& list, const plist::Dictionary& channels, const Write& write) {
+  JsonWriter json = list.elementWriter();
+  for (const plist::Dictionary& channel : channelsIn(channels)) {
+    json.clear();
+    json.beginObject();
+    write(json, channel);
+    json.endObject();
+    list.addText(json.text());
+  }
 }
 
 }  // namespace
 
 void addChannels(JsonList& list, const plist::Dictionary& channels) {
-  for (const plist::Dictionary& channel : channelsIn(channels))
-    list.add(channelJson(channel));
+  addEach(list, channels, writeChannel);
 }
 
 void addSamples(JsonList& list, const plist::Dictionary& samples, bool isDelta) {
-  for (const plist::Dictionary& channel : channelsIn(samples))
-    list.add(sampleJson(channel, isDelta));
+  addEach(list, samples, [isDelta](JsonWriter& json, const plist::Dictionary& channel) {
+    writeSample(json, channel, isDelta);
+  });
 }
 
 }  // namespace tavrel

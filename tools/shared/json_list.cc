@@ -10,6 +10,7 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kElementIndent = "\n    ";
+constexpr std::size_t kElementColumns = kElementIndent.size() - 1;
 
 }  // namespace
 
@@ -39,6 +40,11 @@ void JsonList::add(const Json& element) {
 void JsonList::addText(std::string_view json) {
   beginElement();
   out_ << json;
+}
+
+JsonWriter JsonList::elementWriter() const {
+  if (layout_ == Layout::Line) return JsonWriter(std::nullopt);
+  return JsonWriter(kElementColumns);
 }
 
 void JsonList::end() {

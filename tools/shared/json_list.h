@@ -10,6 +10,7 @@
 #include <iosfwd>
 #include <string_view>
 
+#include "tools/shared/json_writer.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {
@@ -23,9 +24,11 @@ class JsonList {
   JsonList(std::ostream& out, Json head, std::string_view name, Layout layout = Layout::Document);
 
   void add(const Json& element);
-  /// An element that is already JSON without line ends; printed unchanged.
+  /// An element that is JSON already; it is printed as it is.
   void addText(std::string_view json);
-  /// Ends the list, the object and the line.
+  /// Writes elements for `addText` with the indentation that they have in the list.
+  JsonWriter elementWriter() const;
+  /// Ends the list, the object and its line.
   void end();
 
  private:

@@ -10,10 +10,10 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kPath = "/etc/tavrel/system-controls.plist";
+constexpr std::string_view kControlsPath = "/etc/tavrel/system-controls.plist";
 
 /// The largest number that the kernel uses for an error.
-constexpr std::int64_t kLargestErrorNumber = 4095;
+constexpr std::int64_t kLargestControlError = 4095;
 
 SystemControls::Result give(ByteSpan value, MutableByteSpan buffer) {
   if (value.size() > buffer.size()) return {ENOMEM, 0};
@@ -61,7 +61,8 @@ std::array<std::byte, kSwapUsageBytes> swapUsageRecord(std::uint64_t total, std:
 }
 
 SystemControls::Result LinuxSystemControls::read(std::string_view name, MutableByteSpan buffer) {
-  if (!recorded_) recorded_ = readDictionaryFile(files_, propertyLists_, log_, root_.path(kPath));
+  if (!recorded_)
+    recorded_ = readDictionaryFile(files_, propertyLists_, log_, root_.path(kControlsPath));
   if (const plist::Value recorded = recorded_->get(name)) return answer(name, recorded, buffer);
   if (name == "vm.swapusage") return swapUsage(buffer);
   if (name == "kern.next_ecc_event") return eccEvents_.next(buffer);
@@ -76,12 +77,12 @@ SystemControls::Result LinuxSystemControls::answer(std::string_view name,
     return give(*number, buffer);
   }
   if (const auto code = recorded.dictionary().number("errno");
-      code && code->int64() > 0 && code->int64() <= kLargestErrorNumber) {
+      code && code->int64() > 0 && code->int64() <= kLargestControlError) {
     return {code->int32(), 0};
   }
   log_.log(LogLevel::Error,
            "%s: the value of %s is neither bytes nor an integer nor {\"errno\": NUMBER}",
-           root_.path(kPath), name);
+           root_.path(kControlsPath), name);
   return {EINVAL, 0};
 }
 

@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "platform/linux/store/sqlite_index_room.h"
+#include "platform/linux/store/sqlite_library.h"
 
 namespace tavrel {
 namespace {
@@ -48,7 +49,7 @@ Explanation explain(int code) {
 
 // Why the system forbids writing the database; 0 when it does not, or when there is no database.
 int obstacleToWriting(sqlite3* connection) {
-  const char* const name = sqlite3_db_filename(connection, "main");
+  const char* const name = sqlite().db_filename(connection, "main");
   const std::string path = name ? name : "";
   if (path.empty()) return 0;
   const std::string folder = path.substr(0, path.rfind('/') + 1);
@@ -64,10 +65,10 @@ int obstacleToWriting(sqlite3* connection) {
 int systemCodeOf(sqlite3* connection, int code) {
   switch (code & 0xFF) {
     case SQLITE_IOERR:
-      return sqlite3_system_errno(connection);
+      return sqlite().system_errno(connection);
     case SQLITE_CANTOPEN:
       if (const int obstacle = obstacleToWriting(connection)) return obstacle;
-      return sqlite3_system_errno(connection);
+      return sqlite().system_errno(connection);
     case SQLITE_READONLY:
       return obstacleToWriting(connection);
     default:
@@ -77,7 +78,7 @@ int systemCodeOf(sqlite3* connection, int code) {
 
 [[noreturn]] void throwFailure(sqlite3* connection, int code) {
   auto [fault, advice] = explain(code);
-  std::string message = connection ? sqlite3_errmsg(connection) : sqlite3_errstr(code);
+  std::string message = connection ? sqlite().errmsg(connection) : sqlite().errstr(code);
   if (const int systemCode = connection ? systemCodeOf(connection, code) : 0) {
     message += " (";
     message += std::strerror(systemCode);
@@ -153,25 +154,25 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       name = immutableUri(path);
       break;
   }
-  const int code = sqlite3_open_v2(name.c_str(), &handle_, flags, nullptr);
+  const int code = sqlite().open_v2(name.c_str(), &handle_, flags, nullptr);
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
     indexRoom_ = std::make_unique<IndexRoom>(handle_);
-    sqlite3_busy_handler(handle_, waitForLock, busy_.get());
+    sqlite().busy_handler(handle_, waitForLock, busy_.get());
     // The file may come from anywhere, so nothing in its schema may run.
-    sqlite3_db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
-    sqlite3_db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
-    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
-    sqlite3_db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
     execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512");
   } catch (...) {
-    sqlite3_close_v2(handle_);
+    sqlite().close_v2(handle_);
     throw;
   }
 }
 
 SqliteConnection::~SqliteConnection() {
-  sqlite3_close_v2(handle_);
+  if (handle_) sqlite().close_v2(handle_);
 }
 
 SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
@@ -187,7 +188,7 @@ SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept
 }
 
 void SqliteConnection::execute(const char* sql) {
-  const int code = sqlite3_exec(handle_, sql, nullptr, nullptr, nullptr);
+  const int code = sqlite().exec(handle_, sql, nullptr, nullptr, nullptr);
   if (code != SQLITE_OK) throwFailure(handle_, code);
 }
 
@@ -198,50 +199,50 @@ std::int64_t SqliteConnection::integer(std::string_view sql) {
 
 bool SqliteConnection::checkpoint() {
   const int code =
-      sqlite3_wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+      sqlite().wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
   if (code == SQLITE_OK) return true;
   if ((code & 0xFF) == SQLITE_BUSY || (code & 0xFF) == SQLITE_LOCKED) return false;
   throwFailure(handle_, code);
 }
 
 SqliteStatement::SqliteStatement(const SqliteConnection& connection, std::string_view sql) {
-  const int code = sqlite3_prepare_v2(connection.handle(), sql.data(), static_cast<int>(sql.size()),
-                                      &handle_, nullptr);
+  const int code = sqlite().prepare_v2(connection.handle(), sql.data(),
+                                       static_cast<int>(sql.size()), &handle_, nullptr);
   if (code != SQLITE_OK) throwFailure(connection.handle(), code);
 }
 
 SqliteStatement::~SqliteStatement() {
-  sqlite3_finalize(handle_);
+  sqlite().finalize(handle_);
 }
 
 void SqliteStatement::check(int code) const {
-  if (code != SQLITE_OK) throwFailure(sqlite3_db_handle(handle_), code);
+  if (code != SQLITE_OK) throwFailure(sqlite().db_handle(handle_), code);
 }
 
 void SqliteStatement::bind(int index, std::int64_t value) {
-  check(sqlite3_bind_int64(handle_, index, value));
+  check(sqlite().bind_int64(handle_, index, value));
 }
 
 void SqliteStatement::bind(int index, std::string_view bytes) {
   // A null address would bind NULL instead of an empty blob.
   const char* const data = bytes.data() ? bytes.data() : "";
-  check(sqlite3_bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
+  check(sqlite().bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
 }
 
 void SqliteStatement::bindNull(int index) {
-  check(sqlite3_bind_null(handle_, index));
+  check(sqlite().bind_null(handle_, index));
 }
 
 bool SqliteStatement::step() {
-  const int code = sqlite3_step(handle_);
+  const int code = sqlite().step(handle_);
   if (code == SQLITE_ROW) return true;
   if (code == SQLITE_DONE) return false;
-  throwFailure(sqlite3_db_handle(handle_), code);
+  throwFailure(sqlite().db_handle(handle_), code);
 }
 
 void SqliteStatement::reset() {
-  // The code of a reset repeats the failure of the last step, which has been reported.
-  sqlite3_reset(handle_);
+  // The code of a reset repeats the failure of the step before, which has been told.
+  sqlite().reset(handle_);
 }
 
 void SqliteStatement::run() {
@@ -251,16 +252,16 @@ void SqliteStatement::run() {
 }
 
 bool SqliteStatement::isNull(int column) const {
-  return sqlite3_column_type(handle_, column) == SQLITE_NULL;
+  return sqlite().column_type(handle_, column) == SQLITE_NULL;
 }
 
 std::int64_t SqliteStatement::integer(int column) const {
-  return sqlite3_column_int64(handle_, column);
+  return sqlite().column_int64(handle_, column);
 }
 
 std::string_view SqliteStatement::bytes(int column) const {
-  const void* const data = sqlite3_column_blob(handle_, column);
-  const int size = sqlite3_column_bytes(handle_, column);
+  const void* const data = sqlite().column_blob(handle_, column);
+  const int size = sqlite().column_bytes(handle_, column);
   return data ? std::string_view(static_cast<const char*>(data), static_cast<std::size_t>(size))
               : std::string_view();
 }

@@ -6,11 +6,13 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include "platform/linux/store/sqlite_library.h"
+
 namespace tavrel {
 
 IndexRoom::IndexRoom(sqlite3* connection) {
   sqlite3_file* file = nullptr;
-  const int code = sqlite3_file_control(connection, "main", SQLITE_FCNTL_FILE_POINTER,
+  const int code = sqlite().file_control(connection, "main", SQLITE_FCNTL_FILE_POINTER,
                                         static_cast<void*>(&file));
   if (code != SQLITE_OK || !file || !file->pMethods || file->pMethods->iVersion < 2) return;
   methods_ = {*file->pMethods, file->pMethods};

@@ -1,5 +1,6 @@
 #include "platform/linux/system_log/linux_system_log.h"
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <cstdlib>
@@ -60,7 +61,12 @@ void appendField(std::string& out, std::string_view name, std::string_view value
 /// from outside, and a terminal would obey them.
 void appendPrintable(std::string& out, std::string_view text) {
   static constexpr char kDigits[] = "0123456789ABCDEF";
-  while (!text.empty()) {
+  while (true) {
+    const auto plain = std::ranges::find_if_not(
+        text, [](char character) { return character >= 0x20 && character < 0x7F; });
+    out.append(text.begin(), plain);
+    text.remove_prefix(static_cast<std::size_t>(plain - text.begin()));
+    if (text.empty()) return;
     std::string_view rest = text;
     const char32_t codePoint = takeCodePoint(rest);
     const std::string_view taken = text.substr(0, text.size() - rest.size());

@@ -1,0 +1,56 @@
+"""Counts what reaches a block device: its file system's own blocks and journal included, which the
+account that the kernel keeps of a process leaves out."""
+
+import os
+import shutil
+import subprocess
+import tempfile
+
+SECTOR = 512
+IMAGE_BYTES = 1 << 30  # sparse
+
+
+def call(*command):
+    return subprocess.run(command, check=True, capture_output=True, text=True).stdout.strip()
+
+
+class BlockDevice:
+    """An ext4 file system on a loop device, mounted while it is entered. Entering yields nothing,
+    and `reason` says why, where the system does not allow it."""
+
+    def __enter__(self):
+        self.folder = tempfile.mkdtemp(prefix="tavrel_flash.")
+        self.mounted = os.path.join(self.folder, "mounted")
+        self.loop = self.reason = None
+        try:
+            image = os.path.join(self.folder, "image")
+            with open(image, "wb") as file:
+                file.truncate(IMAGE_BYTES)
+            # All is written now, so that nothing of it is written while a run is measured.
+            call("mkfs.ext4", "-q", "-F", "-E", "lazy_itable_init=0,lazy_journal_init=0", image)
+            self.loop = call("losetup", "--find", "--show", image)
+            os.mkdir(self.mounted)
+            call("mount", "-o", "noatime", self.loop, self.mounted)
+        except (OSError, subprocess.CalledProcessError) as error:
+            lines = (getattr(error, "stderr", "") or str(error)).splitlines()
+            self.reason = lines[0] if lines else str(error)
+            return None
+        return self
+
+    def __exit__(self, *_):
+        if self.reason is None:
+            call("umount", self.mounted)
+        if self.loop:
+            call("losetup", "--detach", self.loop)
+        shutil.rmtree(self.folder)
+
+    def written(self):
+        """Bytes since the device exists, with all that waits to be written."""
+        descriptor = os.open(self.mounted, os.O_RDONLY)
+        try:
+            os.fsync(descriptor)
+            call("sync", "--file-system", self.mounted)
+        finally:
+            os.close(descriptor)
+        with open(f"/sys/block/{os.path.basename(self.loop)}/stat", encoding="ascii") as file:
+            return int(file.read().split()[6]) * SECTOR

@@ -1,0 +1,37 @@
+"""The figures that are wanted, all of them, and the account of those that were missed.
+
+    wanted = Wanted()
+    print(f"  memory  {mebibytes:.2f} MiB{wanted.judge('service: memory when idle, MiB', mebibytes)}")
+    sys.exit(wanted.status())
+"""
+
+# The most that each figure may be. Times are CPU times unless the name says otherwise; ratios are
+# to what is measured in the same run.
+LIMITS = {
+    "nothing to do: ratio to an empty program": 2.0,
+    "2,000 scalars, ms": 4.5,
+    "1,000 distributions, ms": 20.0,
+    "report sample of 10,000 channels, ms": 100.0,
+    "report sample of 10,000 channels, MiB": 64.0,
+    "service: memory when idle, MiB": 8.0,
+    "service: delivery to log, wall ms": 50.0,
+}
+
+
+class Wanted:
+    def __init__(self):
+        self.missed = []
+
+    def judge(self, name, figure):
+        """What is to be printed behind a figure."""
+        limit = LIMITS[name]
+        if figure <= limit:
+            return f"   wanted <= {limit:g}"
+        self.missed.append(f"{name}: {figure:.2f}, wanted <= {limit:g}")
+        return f"   MISSED, wanted <= {limit:g}"
+
+    def status(self):
+        """Lists what was missed; the exit status of the program."""
+        for line in self.missed:
+            print(f"missed: {line}")
+        return 1 if self.missed else 0

@@ -1,0 +1,19 @@
+# Headers that most sources need and that take long to compile are precompiled in release builds,
+# which nobody works with from day to day. Other builds go without: there each source must include
+# what it uses.
+#
+# tavrel_precompiled_headers(NAME HEADERS <header>... [LINK target...])
+#
+# Makes a target that owns the headers. Libraries below the calling folder use them.
+function(tavrel_precompiled_headers name)
+  cmake_parse_arguments(ARG "" "" "HEADERS;LINK" ${ARGN})
+  if(NOT CMAKE_BUILD_TYPE STREQUAL Release OR TAVREL_SANITIZE)
+    return()
+  endif()
+  set(source ${CMAKE_CURRENT_BINARY_DIR}/${name}.cc)
+  file(CONFIGURE OUTPUT ${source} CONTENT "// Owns precompiled headers.\n")
+  add_library(${name} STATIC ${source})
+  target_link_libraries(${name} PRIVATE ${ARG_LINK} tavrel_options)
+  target_precompile_headers(${name} PRIVATE ${ARG_HEADERS})
+  set(TAVREL_PRECOMPILED_FROM ${name} PARENT_SCOPE)
+endfunction()
