@@ -93,6 +93,10 @@ CellLook cellIn(ByteSpan bytes, std::uint64_t at) {
   return look;
 }
 
+bool awaitsAcknowledgement(const CellLook& look) {
+  return look.closes % 2 != 0 && look.acknowledged != look.closes;
+}
+
 }  // namespace
 
 BootInstant currentBootInstant() {
@@ -146,8 +150,18 @@ void SegmentReader::readCells(Reading& reading) {
   const std::uint32_t cells =
       std::min<std::uint32_t>(file_.word32(kBHHeaderCellsUsed), kBHCellCount);
   if (reading.position.cells.size() < cells) reading.position.cells.resize(cells);
-  for (std::uint32_t i = 0; i < cells; ++i)
-    readCell(reading, i);
+  // Many at once, to see which hold something new.
+  constexpr std::uint32_t kAtOnce = 64;
+  std::array<std::byte, std::size_t{kAtOnce} * kBHCellBytes> bytes;
+  for (std::uint32_t first = 0; first < cells; first += kAtOnce) {
+    file_.read(kBHCells + std::uint64_t{first} * std::uint64_t{kBHCellBytes}, bytes);
+    for (std::uint32_t i = first; i < std::min(first + kAtOnce, cells); ++i) {
+      const CellLook look = cellIn(bytes, std::uint64_t{i - first} * std::uint64_t{kBHCellBytes});
+      const SegmentPosition::Cell& folded = reading.position.cells[i];
+      const bool isFolded = look.sets == folded.sets && look.value == folded.value;
+      if (look.key != 0 && (!isFolded || awaitsAcknowledgement(look))) readCell(reading, i);
+    }
+  }
 }
 
 // Three looks: at the state, at the value, and whether the state was the same meanwhile.
@@ -187,7 +201,7 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
     }
   }
   folded = {now.sets, now.value};
-  if (before.closes % 2 != 0 && before.acknowledged != before.closes) {
+  if (awaitsAcknowledgement(before)) {
     reading.progress.acknowledgements.push_back({offset + kBHCellAcknowledged, before.closes});
   }
 }
