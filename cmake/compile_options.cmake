@@ -4,8 +4,9 @@ add_library(tavrel_options INTERFACE)
 # Contraction is off so that every CPU gives the same bits for the same sum.
 target_compile_options(tavrel_options INTERFACE
   -Wall -Wextra -Wpedantic -Werror
-  -Wconversion -Wsign-conversion -Wshadow -Wnon-virtual-dtor -Woverloaded-virtual
-  -Wcast-align -Wold-style-cast -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
+  -Wconversion -Wsign-conversion -Wshadow
+  $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor;-Woverloaded-virtual;-Wold-style-cast>
+  -Wcast-align -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
   -ffp-contract=off -fno-math-errno)
 
 # With optimisation, GCC 12 wrongly warns of overlapping copies inside std::string, and of numbers

@@ -1,0 +1,124 @@
+#include <string.h>
+
+#include "internal.h"
+#include "record.h"
+
+_Thread_local struct Lane* bhLane BH_CLIENT_THREAD_LOCAL;
+
+static bool isReusable(struct Chunk* chunk) {
+  const uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
+  return generation != 0 && generation % 2 == 0 &&
+         atomic_load_explicit(&chunk->acknowledged, memory_order_acquire) == generation;
+}
+
+static uint32_t usedChunks(struct Segment* segment) {
+  const uint32_t used = atomic_load_explicit(&segment->chunksUsed, memory_order_acquire);
+  return used < kBHChunkCount ? used : kBHChunkCount;
+}
+
+void bhNoticeFold(struct Process* process, struct Segment* segment) {
+  struct State* state = process->state;
+  const uint64_t folds = atomic_load_explicit(&segment->folds, memory_order_acquire);
+  if (folds == atomic_load_explicit(&state->knownFolds, memory_order_relaxed)) return;
+  int32_t reusable = 0;
+  for (uint32_t i = 0; i < usedChunks(segment); ++i)
+    reusable += isReusable(&segment->chunks[i]);
+  atomic_store_explicit(&state->reusableChunks, reusable, memory_order_relaxed);
+  atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
+  atomic_store_explicit(&state->askedForFold, 0, memory_order_relaxed);
+  atomic_store_explicit(&state->knownFolds, folds, memory_order_relaxed);
+}
+
+/* A chunk whose records have been folded, emptied. */
+static struct Chunk* takeReusable(struct State* state, struct Segment* segment) {
+  if (atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) <= 0) return NULL;
+  const uint32_t used = usedChunks(segment);
+  for (uint32_t tried = 0; tried < used; ++tried) {
+    const uint32_t next =
+        atomic_fetch_add_explicit(&state->nextReusable, 1, memory_order_relaxed) % used;
+    struct Chunk* chunk = &segment->chunks[next];
+    uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
+    if (!isReusable(chunk) || generation % 2 != 0) continue;
+    if (!atomic_compare_exchange_strong(&chunk->generation, &generation, generation + 1)) continue;
+    /* Nobody writes records here: every record of the generation is marked, and what threads
+     * reserve late lies beyond the end. The count that lets them in again comes last. */
+    for (uint32_t i = 0; i < kBHChunkRecords; ++i)
+      atomic_store_explicit(&chunk->records[i].mark, 0, memory_order_relaxed);
+    atomic_store_explicit(&chunk->generation, generation + 2, memory_order_release);
+    atomic_store_explicit(&chunk->reserved, 0, memory_order_release);
+    atomic_fetch_sub_explicit(&state->reusableChunks, 1, memory_order_relaxed);
+    return chunk;
+  }
+  atomic_store_explicit(&state->reusableChunks, 0, memory_order_relaxed);
+  return NULL;
+}
+
+/* Fetches the memory of chunk `index`, and of some more when the process records much. */
+static bool fetchChunk(struct State* state, struct Segment* segment, uint32_t index) {
+  uint32_t fetched = atomic_load_explicit(&state->fetchedChunks, memory_order_relaxed);
+  if (index < fetched) return true;
+  uint32_t ahead = index == 0 ? 1 : index;
+  if (ahead > kLargestFetch) ahead = kLargestFetch;
+  uint32_t end = index + ahead < kBHChunkCount ? index + ahead : kBHChunkCount;
+  if (!bhFetch(&segment->chunks[fetched], (end - fetched) * sizeof(struct Chunk))) {
+    end = index + 1;
+    if (!bhFetch(&segment->chunks[fetched], (end - fetched) * sizeof(struct Chunk))) return false;
+  }
+  while (fetched < end && !atomic_compare_exchange_weak(&state->fetchedChunks, &fetched, end)) {
+  }
+  return true;
+}
+
+/* A chunk that was not used before. */
+static struct Chunk* takeFresh(struct State* state, struct Segment* segment) {
+  uint32_t used = atomic_load_explicit(&segment->chunksUsed, memory_order_relaxed);
+  do {
+    if (used >= kBHChunkCount || !fetchChunk(state, segment, used)) return NULL;
+  } while (!atomic_compare_exchange_weak(&segment->chunksUsed, &used, used + 1));
+  struct Chunk* chunk = &segment->chunks[used];
+  atomic_store_explicit(&chunk->generation, 2, memory_order_release);
+  return chunk;
+}
+
+static struct Chunk* takeChunk(struct Process* process, struct Segment* segment) {
+  struct State* state = process->state;
+  bhNoticeFold(process, segment);
+  struct Chunk* chunk = atomic_exchange(&state->spareChunk, NULL);
+  if (!chunk) chunk = takeReusable(state, segment);
+  if (!chunk) chunk = takeFresh(state, segment);
+  const int32_t free = atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) +
+                       kBHChunkCount - (int32_t)usedChunks(segment);
+  if (!chunk || free < kBHChunkCount / 4) bhAskForFold(process);
+  atomic_store_explicit(&state->isFull, chunk == NULL, memory_order_relaxed);
+  return chunk;
+}
+
+static struct Lane* laneOfThread(struct State* state) {
+  if (!bhLane) {
+    const uint32_t next = atomic_fetch_add_explicit(&state->nextLane, 1, memory_order_relaxed);
+    bhLane = &state->lanes[next % kLanes];
+  }
+  return bhLane;
+}
+
+void bhRecordSlowly(struct Key* key, double value) {
+  struct Process* process = bhProcess();
+  if (!bhIsKey(process, key)) return;
+  struct Segment* segment = bhSegment(process);
+  if (!segment) return;
+
+  uint64_t time = bhSeconds(CLOCK_REALTIME_COARSE);
+  if (!bhIsCredible(time)) time = kBHUndated | bhSeconds(CLOCK_BOOTTIME);
+  const uint32_t number = bhNameKey(process, segment, key);
+  struct Lane* lane = laneOfThread(process->state);
+  while (number != 0) {
+    struct Chunk* chunk = atomic_load_explicit(&lane->chunk, memory_order_acquire);
+    if (chunk && bhPut(chunk, value, bhMark(number, time))) return;
+    struct Chunk* fresh = takeChunk(process, segment);
+    if (!fresh) break;
+    if (!atomic_compare_exchange_strong(&lane->chunk, &chunk, fresh)) {
+      atomic_store(&process->state->spareChunk, fresh);
+    }
+  }
+  bhDrop(segment);
+}

@@ -1,0 +1,106 @@
+/* Record statistics from any program.
+ *
+ *   #include <brimhold/client.h>
+ *   static BHClientScalarKey* starts;                    // a counter of the day
+ *   starts = BHClientScalarForKey("com.example.starts"); // once, when the program starts
+ *   BHClientScalarAdd(starts, 1);                        // anywhere, as often as you like
+ *
+ * Build with `pkg-config --cflags --libs brimhold`.
+ *
+ * Purpose. A scalar is a number per UTC day: counts are added, gauges are set. A distribution is a
+ * series of measurements, each kept with its second. The system folds what programs record into
+ * its statistics store and reports what its whitelist names.
+ *
+ * Cost. An add or a record is a few nanoseconds: a clock read and an atomic add in memory. There
+ * is no daemon, no lock and no write to flash. A process that records takes 20 KiB of memory, and
+ * at most 4 MiB. Now and then, when a page fills up or a day begins, a call makes a system call.
+ *
+ * Guarantees.
+ *  - No call fails towards the program, waits for another thread or process, allocates from the
+ *    heap, changes errno or raises a signal. Where nothing can be recorded the calls do nothing;
+ *    BHClientGetStatus says why.
+ *  - Every call but the two look-ups may be made in a signal handler, and all of them from any
+ *    thread. Handles live as long as the process and stay valid in children.
+ *  - What was recorded before the process ended, however it ended, is folded exactly once. A power
+ *    cut loses what was recorded since the last fold (hourly by default).
+ *  - A value belongs to the UTC day that the clock showed (CLOCK_REALTIME_COARSE, which lags by
+ *    some milliseconds). While the clock is older than this library, as on a device that has just
+ *    started without a battery clock, values are dated once it has been set.
+ *  - A set supersedes what this process added or set earlier that day; of two processes the later
+ *    set counts.
+ *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
+ *    and the system counts the loss.
+ *
+ * After fork the child records into memory of its own. Do not record between vfork and exec.
+ */
+#ifndef BRIMHOLD_CLIENT_H
+#define BRIMHOLD_CLIENT_H
+
+#include <stdint.h>
+
+#ifdef __cplusplus
+extern "C" {
+#endif
+
+#if defined(__GNUC__)
+#define BH_CLIENT_PUBLIC __attribute__((visibility("default")))
+#else
+#define BH_CLIENT_PUBLIC
+#endif
+
+typedef struct BHClientScalarKey BHClientScalarKey;
+typedef struct BHClientDistributionKey BHClientDistributionKey;
+
+/* Looks a key up; the same name gives the same handle. The name is copied. Never NULL: a key that
+ * is NULL, empty, longer than 1024 bytes, has control characters or is one too many (4096 per
+ * process) gets a handle whose
+ * values are dropped. The other calls accept NULL, and drop the value. */
+BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
+BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
+
+/* Adds to today's value, which is 0 before. Sums wrap in two's complement. */
+BH_CLIENT_PUBLIC void BHClientScalarAdd(BHClientScalarKey* key, int64_t amount);
+/* Replaces today's value. */
+BH_CLIENT_PUBLIC void BHClientScalarSet(BHClientScalarKey* key, int64_t value);
+
+/* Appends a measurement. */
+BH_CLIENT_PUBLIC void BHClientDistributionRecord(BHClientDistributionKey* key, double value);
+
+/* Measures how long something takes, on the monotonic clock. A timer may be stopped more than
+ * once; each stop records the time since its start.
+ *
+ *   BHClientTimer timer = BHClientTimerStart();
+ *   work();
+ *   BHClientTimerStopMilliseconds(timer, duration);
+ */
+typedef struct BHClientTimer {
+  uint64_t nanoseconds;
+} BHClientTimer;
+
+BH_CLIENT_PUBLIC BHClientTimer BHClientTimerStart(void);
+BH_CLIENT_PUBLIC void BHClientTimerStopSeconds(BHClientTimer timer, BHClientDistributionKey* key);
+BH_CLIENT_PUBLIC void BHClientTimerStopMilliseconds(BHClientTimer timer,
+                                                    BHClientDistributionKey* key);
+
+typedef enum BHClientStatus {
+  BHClientStatusRecording = 0,   /* values are kept */
+  BHClientStatusNoKey = 1,       /* no key has been looked up yet */
+  BHClientStatusNoFolder = 2,    /* the device has no folder for segments */
+  BHClientStatusNotAllowed = 3,  /* this user may not create files in it */
+  BHClientStatusNotInMemory = 4, /* the folder is not on a tmpfs */
+  BHClientStatusNoSpace = 5,     /* the tmpfs or a limit of the process is exhausted */
+  BHClientStatusUnsupported = 6, /* the kernel lacks what the library needs (Linux 4.14) */
+  BHClientStatusFailed = 7,      /* the system failed for another reason */
+  BHClientStatusFull = 8,        /* values are dropped until the system has folded */
+  BHClientStatusKeyRefused = 9   /* values are kept, but a look-up was refused */
+} BHClientStatus;
+
+/* Says whether values recorded now are kept, and why not. Starts recording if need be. `text`, if
+ * not NULL, receives a sentence that lives as long as the process. */
+BH_CLIENT_PUBLIC BHClientStatus BHClientGetStatus(const char** text);
+
+#ifdef __cplusplus
+}
+#endif
+
+#endif

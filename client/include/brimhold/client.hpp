@@ -1,0 +1,63 @@
+// The C++20 face of brimhold/client.h, which says what is guaranteed and what it costs.
+//
+//   #include <brimhold/client.hpp>
+//   static const brimhold::Scalar starts("com.example.starts");
+//   static const brimhold::Distribution duration("com.example.duration");
+//   starts.add();
+//   duration.record(2.5);
+#pragma once
+
+#include <brimhold/client.h>
+#include <cstdint>
+#include <string>
+#include <string_view>
+
+namespace brimhold {
+
+/// A number per UTC day. Cheap to copy.
+class Scalar {
+ public:
+  explicit Scalar(const char* key) : key_(BHClientScalarForKey(key)) {}
+  explicit Scalar(const std::string& key) : Scalar(key.c_str()) {}
+
+  void add(std::int64_t amount = 1) const noexcept { BHClientScalarAdd(key_, amount); }
+  void set(std::int64_t value) const noexcept { BHClientScalarSet(key_, value); }
+
+ private:
+  BHClientScalarKey* key_;
+};
+
+/// A series of measurements. Cheap to copy.
+class Distribution {
+ public:
+  explicit Distribution(const char* key) : key_(BHClientDistributionForKey(key)) {}
+  explicit Distribution(const std::string& key) : Distribution(key.c_str()) {}
+
+  void record(double value) const noexcept { BHClientDistributionRecord(key_, value); }
+
+  BHClientDistributionKey* handle() const noexcept { return key_; }
+
+ private:
+  BHClientDistributionKey* key_;
+};
+
+/// Records how long its scope took, in seconds.
+class ScopedTimer {
+ public:
+  explicit ScopedTimer(const Distribution& distribution) noexcept : key_(distribution.handle()) {}
+  ScopedTimer(const ScopedTimer&) = delete;
+  ScopedTimer& operator=(const ScopedTimer&) = delete;
+  ~ScopedTimer() { BHClientTimerStopSeconds(timer_, key_); }
+
+ private:
+  BHClientDistributionKey* key_;
+  BHClientTimer timer_ = BHClientTimerStart();
+};
+
+/// Why nothing is recorded, as a sentence; empty while values are kept.
+inline std::string_view whyNotRecording() noexcept {
+  const char* text = nullptr;
+  return BHClientGetStatus(&text) == BHClientStatusRecording ? std::string_view() : text;
+}
+
+}  // namespace brimhold

@@ -1,0 +1,77 @@
+/* What the library's files offer each other. */
+#ifndef BRIMHOLD_INTERNAL_H
+#define BRIMHOLD_INTERNAL_H
+
+#include <errno.h>
+#include <stdbool.h>
+#include <stddef.h>
+#include <stdint.h>
+#include <time.h>
+
+#include "brimhold/client.h"
+#include "layout.h"
+
+/* process.c */
+
+/* The library's memory; NULL before the first look-up and where the kernel lacks what it takes. */
+struct Process* bhProcess(void);
+/* The same, made when missing. */
+struct Process* bhMakeProcess(void);
+
+/* keys.c */
+
+/* Names the key in the segment. Returns its number; 0 when there is no memory for it. */
+uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key* key);
+bool bhWasKeyRefused(void);
+/* A place in the table of keys; not of handles that were refused. */
+bool bhIsKey(const struct Process* process, const struct Key* key);
+
+/* segment.c */
+
+/* The process's segment, begun when it has none; NULL when that fails, see `State.status`. */
+struct Segment* bhSegment(struct Process* process);
+/* Fetches memory, so that a full tmpfs shows here and not as SIGBUS. */
+bool bhFetch(const void* from, size_t bytes);
+void bhAskForFold(struct Process* process);
+void bhDrop(struct Segment* segment);
+
+/* segment_file.c */
+
+/* Makes, maps and describes a new segment; NULL with `status` when that fails. */
+struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status);
+void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment);
+/* Puts empty memory of the process in the place of a mapping that it inherited. */
+void bhForgetMapping(struct Segment* segment);
+void bhPostFoldWanted(const char* folder);
+
+/* facts.c */
+
+/* Who the process is, for readers; what cannot be found out stays 0. */
+void bhDescribeProcess(struct Segment* segment);
+
+/* cells.c */
+
+/* The cell of the key for what the clocks show; NULL, counted as dropped, when there is none. */
+struct Cell* bhFindCell(struct Key* key);
+
+/* chunks.c */
+
+/* Looks what the last fold has freed. */
+void bhNoticeFold(struct Process* process, struct Segment* segment);
+/* Records where the fast path could not. */
+void bhRecordSlowly(struct Key* key, double value);
+
+/* Times. */
+
+static inline uint64_t bhSeconds(clockid_t clock) {
+  struct timespec now = {0};
+  clock_gettime(clock, &now);
+  return (uint64_t)now.tv_sec;
+}
+
+/* Whether a clock that shows `seconds` can be right. */
+static inline bool bhIsCredible(uint64_t seconds) {
+  return (int64_t)seconds >= BRIMHOLD_BUILD_DAY * (int64_t)kBHSecondsPerDay;
+}
+
+#endif

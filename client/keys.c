@@ -1,0 +1,125 @@
+/* The keys of the process. They are found without locks, so that a child of a process with threads
+ * can look keys up too. Names live in static memory at the offsets that they have in segments. */
+#include <string.h>
+
+#include "internal.h"
+
+enum { kBuckets = 2 * kBHKeys };
+
+static char names[kBHNamesBytes];
+static _Atomic uint32_t usedNames;
+static _Atomic uint32_t usedKeys;
+static uint64_t entries[kBHKeys];          /* as in segments */
+static _Atomic uint32_t buckets[kBuckets]; /* index + 1 */
+static _Atomic int wasKeyRefused;
+
+static struct Key refusedKey;
+
+bool bhWasKeyRefused(void) {
+  return atomic_load_explicit(&wasKeyRefused, memory_order_relaxed);
+}
+
+bool bhIsKey(const struct Process* process, const struct Key* key) {
+  return process && key >= process->state->keys && key < process->state->keys + kBHKeys;
+}
+
+static uint32_t offsetOf(uint64_t entry) {
+  return (uint32_t)entry;
+}
+static uint32_t lengthOf(uint64_t entry) {
+  return (uint32_t)(entry >> 32) & 0xffff;
+}
+
+static uint32_t hashOf(const char* name, uint32_t length, uint32_t kind) {
+  uint32_t hash = 2166136261U ^ kind;
+  for (uint32_t i = 0; i < length; ++i)
+    hash = (hash ^ (unsigned char)name[i]) * 16777619U;
+  return hash;
+}
+
+/* Takes `amount` of `limit`; answers where it begins, or `limit` when it does not fit. */
+static uint32_t take(_Atomic uint32_t* used, uint32_t amount, uint32_t limit) {
+  uint32_t start = atomic_load(used);
+  do {
+    if (amount > limit - start) return limit;
+  } while (!atomic_compare_exchange_weak(used, &start, start + amount));
+  return start;
+}
+
+/* Index + 1 of a new key, or 0. */
+static uint32_t addKey(const char* name, uint32_t length, uint32_t kind) {
+  const uint32_t offset = take(&usedNames, length, kBHNamesBytes);
+  if (offset == kBHNamesBytes) return 0;
+  const uint32_t index = take(&usedKeys, 1, kBHKeys);
+  if (index == kBHKeys) return 0;
+  memcpy(names + offset, name, length);
+  entries[index] = offset | (uint64_t)length << 32 | (uint64_t)kind << 48;
+  return index + 1;
+}
+
+static struct Key* refuse(void) {
+  atomic_store_explicit(&wasKeyRefused, 1, memory_order_relaxed);
+  return &refusedKey;
+}
+
+/* 0 for what is no name. */
+static size_t lengthOfName(const char* name) {
+  const size_t length = name ? strnlen(name, kBHLongestName + 1) : 0;
+  if (length > kBHLongestName) return 0;
+  for (size_t i = 0; i < length; ++i) {
+    if ((unsigned char)name[i] < ' ' || name[i] == 127) return 0;
+  }
+  return length;
+}
+
+static struct Key* keyFor(const char* name, uint32_t kind) {
+  const int error = errno;
+  struct Process* process = bhMakeProcess();
+  errno = error;
+  const size_t length = lengthOfName(name);
+  if (!process || length == 0) return refuse();
+
+  uint32_t added = 0;
+  for (uint32_t at = hashOf(name, (uint32_t)length, kind);; ++at) {
+    uint32_t found = atomic_load_explicit(&buckets[at % kBuckets], memory_order_acquire);
+    if (found == 0) {
+      if (added == 0) added = addKey(name, (uint32_t)length, kind);
+      if (added == 0) return refuse();
+      /* The loser of a race leaves its entry unused. */
+      if (atomic_compare_exchange_strong_explicit(&buckets[at % kBuckets], &found, added,
+                                                  memory_order_acq_rel, memory_order_acquire)) {
+        return &process->state->keys[added - 1];
+      }
+    }
+    const uint64_t entry = entries[found - 1];
+    if (entry >> 48 == kind && lengthOf(entry) == length &&
+        memcmp(names + offsetOf(entry), name, length) == 0) {
+      return &process->state->keys[found - 1];
+    }
+  }
+}
+
+BHClientScalarKey* BHClientScalarForKey(const char* key) {
+  return (BHClientScalarKey*)keyFor(key, kBHKindScalar);
+}
+
+BHClientDistributionKey* BHClientDistributionForKey(const char* key) {
+  return (BHClientDistributionKey*)keyFor(key, kBHKindDistribution);
+}
+
+uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key* key) {
+  uint32_t number = atomic_load_explicit(&key->number, memory_order_relaxed);
+  if (number != 0) return number;
+  const uint32_t index = (uint32_t)(key - process->state->keys);
+  const uint64_t entry = entries[index];
+  char* name = segment->names + offsetOf(entry);
+  if (!bhFetch(name, lengthOf(entry)) ||
+      !bhFetch(&segment->keys[index], sizeof segment->keys[index])) {
+    return 0;
+  }
+  /* Threads that do this together write the same. */
+  memcpy(name, names + offsetOf(entry), lengthOf(entry));
+  atomic_store_explicit(&segment->keys[index], entry, memory_order_release);
+  atomic_store_explicit(&key->number, index + 1, memory_order_release);
+  return index + 1;
+}

@@ -1,0 +1,48 @@
+#include <stdlib.h>
+#include <string.h>
+#include <sys/mman.h>
+
+#include "internal.h"
+
+static _Atomic(struct Process*) theProcess;
+
+struct Process* bhProcess(void) {
+  return atomic_load_explicit(&theProcess, memory_order_acquire);
+}
+
+static void* mapMemory(size_t bytes) {
+  void* memory = mmap(NULL, bytes, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  return memory == MAP_FAILED ? NULL : memory;
+}
+
+static bool findFolder(char folder[kLongestFolder]) {
+  static const char kFolder[] = "/run/tavrel/stat";
+  /* A program that runs with more rights than its caller does not take paths from him. */
+  const char* root = secure_getenv("TAVREL_ROOT");
+  size_t length = root ? strlen(root) : 0;
+  while (length > 0 && root[length - 1] == '/')
+    --length;
+  if (length + sizeof kFolder > kLongestFolder) return false;
+  if (length > 0) memcpy(folder, root, length);
+  memcpy(folder + length, kFolder, sizeof kFolder);
+  return true;
+}
+
+struct Process* bhMakeProcess(void) {
+  struct Process* known = bhProcess();
+  if (known) return known;
+
+  struct Process* process = mapMemory(sizeof *process);
+  struct State* state = mapMemory(sizeof *state);
+  if (process && state && findFolder(process->folder) &&
+      madvise(state, sizeof *state, MADV_WIPEONFORK) == 0) {
+    process->state = state;
+    if (atomic_compare_exchange_strong_explicit(&theProcess, &known, process, memory_order_acq_rel,
+                                                memory_order_acquire)) {
+      return process;
+    }
+  }
+  if (process) munmap(process, sizeof *process);
+  if (state) munmap(state, sizeof *state);
+  return known;
+}

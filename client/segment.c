@@ -1,0 +1,96 @@
+#include "internal.h"
+
+/* A child that records lets go of its parent's segment, which can then be retired. Memory stays in
+ * its place: the child may have been made by a signal handler within a record, and returns there.
+ */
+static void forgetParent(struct Process* process, struct Segment* inherited) {
+  if (inherited && atomic_compare_exchange_strong(&process->mapped, &inherited, NULL)) {
+    bhForgetMapping(inherited);
+  }
+}
+
+struct Segment* bhSegment(struct Process* process) {
+  struct State* state = process->state;
+  /* Read first: a segment of this process is published before it is noted as mapped. */
+  struct Segment* mapped = atomic_load(&process->mapped);
+  struct Segment* known = atomic_load_explicit(&state->segment, memory_order_acquire);
+  if (known) return known;
+  forgetParent(process, mapped);
+  const uint64_t now = bhSeconds(CLOCK_MONOTONIC_COARSE);
+  if (now < atomic_load_explicit(&state->retryAt, memory_order_relaxed)) return NULL;
+
+  char name[64];
+  BHClientStatus status = BHClientStatusFailed;
+  struct Segment* begun = bhBeginSegment(process->folder, name, &status);
+  if (!begun) {
+    atomic_store_explicit(&state->status, status, memory_order_relaxed);
+    atomic_store_explicit(&state->retryAt, now + kRetrySeconds, memory_order_relaxed);
+    return atomic_load_explicit(&state->segment, memory_order_acquire);
+  }
+  /* Nobody waits for another thread here, or for the code that a signal handler interrupted: each
+   * begins a segment, and one of them stays. */
+  if (atomic_compare_exchange_strong_explicit(&state->segment, &known, begun, memory_order_acq_rel,
+                                              memory_order_acquire)) {
+    atomic_store(&process->mapped, begun);
+    return begun;
+  }
+  bhAbandonSegment(process->folder, name, begun);
+  return known;
+}
+
+void bhAskForFold(struct Process* process) {
+  if (atomic_exchange_explicit(&process->state->askedForFold, 1, memory_order_relaxed) == 0) {
+    bhPostFoldWanted(process->folder);
+  }
+}
+
+void bhDrop(struct Segment* segment) {
+  atomic_fetch_add_explicit(&segment->dropped, 1, memory_order_relaxed);
+}
+
+static const char* textOf(BHClientStatus status) {
+  switch (status) {
+    case BHClientStatusRecording:
+      return "values are recorded";
+    case BHClientStatusNoKey:
+      return "no key has been looked up yet";
+    case BHClientStatusNoFolder:
+      return "the device has no folder /run/tavrel/stat: nothing is recorded";
+    case BHClientStatusNotAllowed:
+      return "this user may not create files in /run/tavrel/stat: nothing is recorded";
+    case BHClientStatusNotInMemory:
+      return "/run/tavrel/stat is not on a tmpfs: nothing is recorded";
+    case BHClientStatusNoSpace:
+      return "the tmpfs of /run/tavrel/stat, or a limit of the process, is exhausted: nothing is "
+             "recorded";
+    case BHClientStatusUnsupported:
+      return "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long: nothing is recorded";
+    case BHClientStatusFailed:
+      return "the system failed to create a file in /run/tavrel/stat: nothing is recorded";
+    case BHClientStatusFull:
+      return "the segment is full: values are dropped until the next fold";
+    case BHClientStatusKeyRefused:
+      return "values are recorded, but not those of a key that was refused: empty, longer than "
+             "1024 bytes, with control characters, or one too many";
+  }
+  return "unknown status";
+}
+
+static BHClientStatus currentStatus(void) {
+  struct Process* process = bhProcess();
+  if (!process) return bhWasKeyRefused() ? BHClientStatusUnsupported : BHClientStatusNoKey;
+  struct State* state = process->state;
+  if (!bhSegment(process)) {
+    return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
+  }
+  if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
+  return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
+}
+
+BHClientStatus BHClientGetStatus(const char** text) {
+  const int error = errno;
+  const BHClientStatus status = currentStatus();
+  if (text) *text = textOf(status);
+  errno = error;
+  return status;
+}

@@ -1,0 +1,172 @@
+#include <fcntl.h>
+#include <linux/magic.h>
+#include <string.h>
+#include <sys/mman.h>
+#include <sys/resource.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/vfs.h>
+#include <unistd.h>
+
+#include "internal.h"
+
+#ifndef MADV_POPULATE_WRITE
+#define MADV_POPULATE_WRITE 23
+#endif
+
+/* System calls directly: the library's functions are points where a thread may be cancelled. */
+static int openFile(int folder, const char* name, int flags, int mode) {
+  return (int)syscall(SYS_openat, folder, name, flags | O_CLOEXEC, mode);
+}
+static void closeFile(int file) {
+  syscall(SYS_close, file);
+}
+
+static BHClientStatus statusOf(int error) {
+  switch (error) {
+    case ENOENT:
+    case ENOTDIR:
+      return BHClientStatusNoFolder;
+    case EACCES:
+    case EPERM:
+    case EROFS:
+      return BHClientStatusNotAllowed;
+    case ENOSPC:
+    case EDQUOT:
+    case EFBIG:
+    case ENOMEM:
+    case EMFILE:
+    case ENFILE:
+    case EFAULT: /* memory that could not be fetched */
+      return BHClientStatusNoSpace;
+    default:
+      return BHClientStatusFailed;
+  }
+}
+
+static char* appendHex(char* to, uint64_t number) {
+  for (int shift = 60; shift >= 0; shift -= 4)
+    *to++ = "0123456789abcdef"[number >> shift & 15];
+  return to;
+}
+
+/* "<time>-<thread>.segment" */
+static void makeName(char name[64], unsigned attempt) {
+  struct timespec now = {0};
+  clock_gettime(CLOCK_MONOTONIC, &now);
+  name = appendHex(name, (uint64_t)now.tv_sec * 1000000000U + (uint64_t)now.tv_nsec + attempt);
+  *name++ = '-';
+  name = appendHex(name, (uint64_t)syscall(SYS_gettid));
+  memcpy(name, ".segment", sizeof ".segment");
+}
+
+void bhForgetMapping(struct Segment* segment) {
+  mmap(segment, kBHSegmentBytes, PROT_READ | PROT_WRITE,
+       MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED, -1, 0);
+}
+
+static int openFolder(const char* folder) {
+  return openFile(AT_FDCWD, folder, O_PATH | O_DIRECTORY, 0);
+}
+
+void bhPostFoldWanted(const char* folder) {
+  const int directory = openFolder(folder);
+  if (directory < 0) return;
+  const int file =
+      openFile(directory, "fold-wanted", O_WRONLY | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+  if (file >= 0) closeFile(file);
+  closeFile(directory);
+}
+
+/* Growing a file beyond this limit would raise SIGXFSZ. */
+static bool mayMakeFilesThatLarge(void) {
+  struct rlimit limit;
+  return getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur >= kBHSegmentBytes;
+}
+
+static struct Segment* mapSegment(int file) {
+  if (!mayMakeFilesThatLarge()) {
+    errno = EFBIG;
+    return NULL;
+  }
+  if (ftruncate(file, kBHSegmentBytes) != 0) return NULL;
+  void* memory = mmap(NULL, kBHSegmentBytes, PROT_READ | PROT_WRITE, MAP_SHARED, file, 0);
+  if (memory == MAP_FAILED) return NULL;
+  struct Segment* segment = memory;
+
+  bool isThere = madvise(segment, kBHKeyTable, MADV_POPULATE_WRITE) == 0;
+  /* Before Linux 5.14 memory is only fetched through the file, so all of it now. */
+  if (!isThere && errno == EINVAL) {
+    isThere = syscall(SYS_fallocate, file, 0, (off_t)0, (off_t)kBHSegmentBytes) == 0;
+  }
+  if (!isThere) {
+    const int error = errno;
+    munmap(segment, kBHSegmentBytes);
+    errno = error;
+    return NULL;
+  }
+  return segment;
+}
+
+bool bhFetch(const void* from, size_t bytes) {
+  const uintptr_t first = (uintptr_t)from & ~(uintptr_t)4095;
+  const uintptr_t end = (uintptr_t)from + bytes;
+  int result;
+  do {
+    result = madvise((void*)first, end - first, MADV_POPULATE_WRITE);
+  } while (result != 0 && errno == EINTR);
+  return result == 0 || errno == EINVAL;
+}
+
+static struct Segment* beginIn(int directory, char name[64], BHClientStatus* status) {
+  int file = -1;
+  for (unsigned attempt = 0; attempt < kNameAttempts; ++attempt) {
+    makeName(name, attempt);
+    file = openFile(directory, name, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
+    if (file >= 0 || errno != EEXIST) break;
+  }
+  if (file < 0) {
+    *status = statusOf(errno);
+    return NULL;
+  }
+  struct Segment* segment = mapSegment(file);
+  if (!segment) {
+    *status = statusOf(errno);
+    unlinkat(directory, name, 0);
+  } else {
+    bhDescribeProcess(segment);
+    atomic_store_explicit(&segment->magic, kBHSegmentMagic, memory_order_release);
+  }
+  closeFile(file);
+  return segment;
+}
+
+struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status) {
+  const int directory = openFolder(folder);
+  if (directory < 0) {
+    *status = statusOf(errno);
+    return NULL;
+  }
+  struct Segment* segment = NULL;
+  struct statfs fileSystem;
+  struct stat entries;
+  if (fstatfs(directory, &fileSystem) != 0 || fileSystem.f_type != TMPFS_MAGIC) {
+    *status = BHClientStatusNotInMemory;
+  } else {
+    segment = beginIn(directory, name, status);
+    /* The size of a folder of a tmpfs is 20 bytes per entry. */
+    if (fstat(directory, &entries) == 0 && entries.st_size / 20 > kSegmentsBeforeFold) {
+      bhPostFoldWanted(folder);
+    }
+  }
+  closeFile(directory);
+  return segment;
+}
+
+void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment) {
+  munmap(segment, kBHSegmentBytes);
+  const int directory = openFolder(folder);
+  if (directory < 0) return;
+  unlinkat(directory, name, 0);
+  closeFile(directory);
+}

@@ -1,0 +1,65 @@
+// The parts of a segment that hold something, as the fuzzer likes them: the first bytes of the
+// header, the table of keys, the names, the cells and two chunks. The file is read twice: a second
+// read from where the first ended yields nothing, and what was yielded has a valid name.
+#include <algorithm>
+#include <cstdint>
+#include <cstdlib>
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include "base/utf8.h"
+#include "client/segment_format.h"
+#include "platform/linux/segments/segment_reader.h"
+
+using namespace tavrel;
+
+namespace {
+
+// Where the input goes, in its order, and how much of it.
+constexpr struct {
+  std::uint64_t offset;
+  std::size_t bytes;
+} kParts[] = {{0, 264}, {kBHKeyTable, 32}, {kBHNames, 64}, {kBHCells, 256}, {kBHChunks, 8192}};
+
+struct Checked : SegmentSink {
+  void check(std::string_view key, bool isInDay) {
+    ++values;
+    if (key.empty() || key.size() > kBHLongestName || !isValidUtf8(key) || !isInDay) std::abort();
+  }
+  void takeScalar(const SegmentScalar& scalar) override { check(scalar.key, true); }
+  void takeRecord(const SegmentRecord& record) override {
+    check(record.key, record.secondsInDay < kBHSecondsPerDay);
+  }
+  std::size_t values = 0;
+};
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  static const int file = memfd_create("segment", MFD_CLOEXEC);
+  if (size == 0 || ftruncate(file, 0) != 0 || ftruncate(file, kBHSegmentBytes) != 0) return 0;
+  const std::uint8_t options = *data++;
+  --size;
+  for (const auto& part : kParts) {
+    const std::size_t bytes = std::min(part.bytes, size);
+    if (pwrite(file, data, bytes, static_cast<off_t>(part.offset)) < 0) std::abort();
+    data += bytes;
+    size -= bytes;
+  }
+  const BootInstant boot = (options & 1) != 0 ? BootInstant(1'700'000'000) : std::nullopt;
+  const bool writerIsGone = (options & 2) != 0;
+
+  SegmentReader reader(file);
+  if (const auto state = reader.state(); !state && state.error().message.empty()) std::abort();
+  SegmentPosition position;
+  Checked first;
+  const SegmentProgress progress = reader.read(position, boot, writerIsGone, first);
+  const auto again = SegmentPosition::decode(position.encode());
+  if (!again || *again != position) std::abort();
+  Checked second;
+  if (reader.read(position, boot, writerIsGone, second).dropped != 0 || second.values != 0) {
+    std::abort();
+  }
+  if (!acknowledge(file, progress)) std::abort();
+  return 0;
+}

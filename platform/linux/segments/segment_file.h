@@ -1,0 +1,51 @@
+// The parts of a segment's file that are read as they stand: bytes, header and names of keys.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+
+#include "base/bytes.h"
+
+namespace tavrel {
+
+/// What the header says about the process that made the segment. Claims, like all of a segment.
+struct SegmentFacts {
+  std::array<std::byte, 16> identity{};
+  std::array<std::byte, 16> boot{};
+  std::uint64_t pidNamespace = 0;
+  std::uint64_t processStart = 0;  // clock ticks since boot
+  std::uint32_t pid = 0;
+};
+
+/// Bytes that end early, as of a file that was truncated, read as zero.
+class SegmentFile {
+ public:
+  /// Borrows the descriptor.
+  explicit SegmentFile(int descriptor) : descriptor_(descriptor) {}
+
+  void read(std::uint64_t offset, MutableByteSpan into) const;
+  std::uint32_t word32(std::uint64_t offset) const;
+  std::uint64_t word64(std::uint64_t offset) const;
+
+  SegmentFacts facts() const;
+
+  /// The name of the key of this number, nothing when it has none of this kind that is valid.
+  std::optional<std::string_view> key(std::uint32_t number, std::uint8_t kind);
+
+ private:
+  struct Key {
+    std::uint8_t kind = 0;
+    std::string name;
+  };
+
+  Key readKey(std::uint32_t number) const;
+
+  int descriptor_;
+  std::map<std::uint32_t, Key> keys_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,42 @@
+// How far a segment has been folded: what a store remembers with the values that it took, so that
+// each is taken once.
+//
+// The bytes of a position hold only what was used of the segment: 16 bytes per cell and 8 per
+// chunk, at most 138 KB.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/expected.h"
+
+namespace tavrel {
+
+struct SegmentPosition {
+  /// A scalar's cell: what of it has been folded.
+  struct Cell {
+    std::uint64_t sets = 0;
+    std::int64_t value = 0;
+    bool operator==(const Cell&) const = default;
+  };
+  /// A chunk of records: how many of this generation have been folded.
+  struct Chunk {
+    std::uint32_t generation = 0;
+    std::uint32_t folded = 0;
+    bool operator==(const Chunk&) const = default;
+  };
+
+  std::vector<Cell> cells;
+  std::vector<Chunk> chunks;
+  std::uint64_t dropped = 0;  // values that the program lost, as far as they have been reported
+
+  bool operator==(const SegmentPosition&) const = default;
+
+  std::string encode() const;
+  /// Refuses bytes that `encode` did not write.
+  static Expected<SegmentPosition> decode(std::string_view bytes);
+};
+
+}  // namespace tavrel

@@ -1,0 +1,150 @@
+// Segments that no honest program leaves.
+#include <limits>
+#include <random>
+
+#include "recording.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::uint64_t kExtremes[] = {0,
+                                       1,
+                                       0x7f,
+                                       0xffff,
+                                       0x7fffffff,
+                                       0xffffffff,
+                                       std::uint64_t{1} << 62,
+                                       0x7fffffffffffffff,
+                                       std::uint64_t{1} << 63,
+                                       ~std::uint64_t{0}};
+
+class HostileSegment : public Recording {
+ protected:
+  HostileSegment() {
+    run([] {
+      BHClientScalarSet(BHClientScalarForKey("gauge"), 3);
+      for (int i = 0; i < 300; ++i)
+        BHClientDistributionRecord(BHClientDistributionForKey("series"), i);
+    });
+    file_ = Descriptor(open(segments().at(0).c_str(), O_RDWR));
+    original_.resize(0xd0000);
+    EXPECT_EQ(pread(file_.get(), original_.data(), original_.size(), 0), 0xd0000);
+  }
+
+  void write(std::uint64_t offset, std::uint64_t word, std::size_t size = 8) {
+    EXPECT_EQ(pwrite(file_.get(), &word, size, static_cast<off_t>(offset)),
+              static_cast<ssize_t>(size));
+  }
+  void restore() {
+    EXPECT_EQ(ftruncate(file_.get(), kBHSegmentBytes), 0);
+    EXPECT_EQ(pwrite(file_.get(), original_.data(), original_.size(), 0), 0xd0000);
+  }
+
+  /// The error, else what was read: "SCALARS RECORDS REFUSED".
+  std::string readAll(bool writerIsGone = true) {
+    scalars.clear();
+    records.clear();
+    SegmentReader reader(file_.get());
+    const auto state = reader.state();
+    if (!state) return state.error().message;
+    if (*state == SegmentReader::State::Empty) return "empty";
+    SegmentPosition position;
+    const SegmentProgress progress = reader.read(position, boot, writerIsGone, *this);
+    EXPECT_EQ(*SegmentPosition::decode(position.encode()), position);
+    for (const auto& [name, value] : scalars)
+      EXPECT_EQ(name.first, "gauge");
+    for (const auto& [name, values] : records)
+      EXPECT_EQ(name, "series");
+    return std::to_string(scalars.size()) + " " + std::to_string(records["series"].size()) + " " +
+           std::to_string(progress.refused);
+  }
+
+  Descriptor file_;
+  std::string original_;
+};
+
+TEST_F(HostileSegment, IsRefusedOrSkipped) {
+  const std::uint64_t secondChunk = kBHChunks + kBHChunkBytes;
+  const std::uint64_t key = SegmentFile(file_.get()).word64(kBHKeyTable + 8);
+  const std::uint64_t mark = SegmentFile(file_.get()).word64(kBHChunks + kBHChunkFirst + 8);
+  const struct {
+    const char* what;
+    std::uint64_t offset;
+    std::uint64_t word;
+    const char* outcome;
+  } cases[] = {
+      {"nothing", kBHHeaderFolds, 0, "1 300 0"},
+      {"magic absent", kBHHeaderMagic, 0, "empty"},
+      {"magic", kBHHeaderMagic, 1, "not a segment"},
+      {"version", kBHHeaderVersion, 2, "a segment of version 2, not 1"},
+      {"size", kBHHeaderBytes, 4096, "a segment of a wrong size"},
+      {"chunks beyond", kBHHeaderCellsUsed, 0xffffffffffffffff, "1 300 0"},
+      {"no chunks, no cells", kBHHeaderCellsUsed, 0, "0 0 0"},
+      {"cell: not midnight", kBHCells, kToday * 86'400 + 1, "0 300 1"},
+      {"cell: day beyond 32 bits", kBHCells, 86'400ULL << 32, "0 300 1"},
+      {"cell: unused", kBHCells + kBHCellKey, 0, "0 300 0"},
+      {"cell: another kind", kBHCells + kBHCellKey, 2, "0 300 1"},
+      {"cell: key beyond", kBHCells + kBHCellKey, kBHKeys + 1, "0 300 1"},
+      {"key: absent", kBHKeyTable + 8, 0, "1 0 300"},
+      {"key: name beyond", kBHKeyTable + 8, key | (kBHNamesBytes - 3), "1 0 300"},
+      {"key: too long", kBHKeyTable + 8, key | 0x800'0000'0000, "1 0 300"},
+      {"key: empty", kBHKeyTable + 8, key & ~0xffff'0000'0000ULL, "1 0 300"},
+      {"key: kind", kBHKeyTable + 8, key ^ (1ULL << 48), "1 0 300"},
+      {"name: line break", kBHNames + 5, 0x0a0a0a0a0a0a0a0a, "1 0 300"},
+      {"name: not UTF-8", kBHNames + 5, 0xffffffffffffffff, "1 0 300"},
+      {"chunk: unused", secondChunk + kBHChunkGeneration, 0, "1 255 0"},
+      {"chunk: being emptied", secondChunk + kBHChunkGeneration, 3, "1 255 0"},
+      {"record: hole", kBHChunks + kBHChunkFirst + 8, 0, "1 299 0"},
+      {"record: key", kBHChunks + kBHChunkFirst + 8, mark | 0xffff, "1 299 1"},
+      {"record: latest", kBHChunks + kBHChunkFirst + 8, ~kBHUndated & ~0xfffdULL, "1 300 0"},
+  };
+  for (const auto& each : cases) {
+    write(each.offset, each.word);
+    EXPECT_EQ(readAll(), each.outcome) << each.what;
+    restore();
+  }
+  write(kBHChunks + kBHChunkFirst + 8, 0);
+  EXPECT_EQ(readAll(false), "1 45 0");  // it may still come
+  EXPECT_EQ(ftruncate(file_.get(), kBHChunks), 0);
+  EXPECT_EQ(readAll(), "a segment of a wrong size");
+  EXPECT_EQ(ftruncate(file_.get(), 0), 0);
+  EXPECT_EQ(readAll(), "empty");
+  EXPECT_FALSE(SegmentPosition::decode(std::string(40, '\xff')));
+  EXPECT_FALSE(SegmentPosition::decode("short"));
+}
+
+TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
+  std::vector<std::uint64_t> fields;
+  for (std::uint64_t field = 0; field < 512; field += 8)
+    fields.push_back(field);
+  for (std::uint64_t i = 0; i < 8; ++i)
+    fields.insert(fields.end(), {kBHCells + 8 * i, kBHChunks + 8 * i, kBHKeyTable + 8 * i});
+  for (const std::uint64_t field : fields) {
+    for (const std::uint64_t word : kExtremes) {
+      write(field, word);
+      readAll();
+      boot = std::nullopt;
+      readAll(false);
+      boot = std::numeric_limits<std::int64_t>::max();
+      readAll();
+      boot = 0;
+    }
+    restore();
+  }
+  std::mt19937_64 random(5);
+  for (int round = 0; round < 2000; ++round) {
+    for (int i = 0; i < 20; ++i) {
+      const std::uint64_t from[] = {64, kBHKeyTable, kBHNames, kBHCells, kBHChunks};
+      write(from[random() % 5] + random() % 64, random(), 1 + random() % 8);
+    }
+    scalars.clear();
+    records.clear();
+    SegmentPosition position;
+    SegmentReader(file_.get()).read(position, boot, round % 2 == 0, *this);
+    EXPECT_LE(scalars.size(), std::size_t{kBHCellCount});
+    restore();
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,56 @@
+// What is installed builds the examples of the documentation, through pkg-config and as a CMake
+// package; the shared library offers its own names only, and needs nothing but libc.
+#include <cstdlib>
+
+#include "recording.h"
+
+namespace tavrel {
+namespace {
+
+std::string outputOf(const std::string& command) {
+  FILE* const pipe = popen((command + " 2>&1").c_str(), "r");
+  std::string output;
+  char part[4096];
+  while (const std::size_t size = fread(part, 1, sizeof part, pipe))
+    output.append(part, size);
+  EXPECT_EQ(pclose(pipe), 0) << command << "\n" << output;
+  return output;
+}
+
+TEST_F(Recording, InstalledFilesBuildTheExamples) {
+  const std::string to = root / "installed";
+  const std::string examples = TAVREL_EXAMPLES "/record";
+  outputOf("cmake --install " TAVREL_BUILD " --component brimhold --prefix " + to);
+  const std::string pc = outputOf("find " + to + " -name brimhold.pc");
+  const std::string lib = std::filesystem::path(pc).parent_path().parent_path();
+  const std::string flags = outputOf(
+      "PKG_CONFIG_PATH=" + lib + "/pkgconfig pkg-config --define-prefix --cflags --libs brimhold");
+  const std::string warnings = " -Wall -Wextra -Wpedantic -Werror ";
+  std::string line = "cc -std=c11" + warnings + examples + "/record.c -o " + to + "/c " + flags;
+  line.pop_back();
+  outputOf(line + " " TAVREL_LINK_FLAGS);
+  line = "c++ -std=c++20" + warnings + examples + "/record.cc -o " + to + "/cpp " + flags;
+  line.pop_back();
+  outputOf(line + " " TAVREL_LINK_FLAGS);
+  outputOf("cmake -S " + examples + " -B " + to + "/build -DCMAKE_PREFIX_PATH=" + to +
+           " -DCMAKE_EXE_LINKER_FLAGS='" TAVREL_LINK_FLAGS "' && cmake --build " + to + "/build");
+  for (const char* program : {"/c", "/cpp", "/build/record", "/build/record_cpp"})
+    EXPECT_EQ(outputOf("LD_LIBRARY_PATH=" + lib + " " + to + program), "");
+
+  testClock().realtime = 0;
+  fold();
+  ASSERT_EQ(scalars.size(), 1U);
+  EXPECT_EQ(scalars.begin()->first.first, "com.example.starts");
+  EXPECT_EQ(scalars.begin()->second, 4);
+  EXPECT_EQ(records["com.example.seconds"], std::vector<double>(4, 2.5));
+
+  const std::string library = lib + "/libbrimhold.so.1";
+  EXPECT_EQ(
+      outputOf("nm -D --defined-only " + library + " | grep -cv ' T BHClient.*@@BRIMHOLD_1.0$'"),
+      "1\n");  // the name of the version
+  EXPECT_EQ(outputOf("readelf -d " + library + " | grep -c 'libstdc++\\|libm\\.\\|libgcc' || true"),
+            "0\n");
+}
+
+}  // namespace
+}  // namespace tavrel

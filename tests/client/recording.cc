@@ -1,0 +1,84 @@
+#include "recording.h"
+
+#include <algorithm>
+#include <cstdlib>
+#include <ctime>
+
+extern "C" {
+int __real_clock_gettime(clockid_t clock, timespec* now);
+int __wrap_clock_gettime(clockid_t clock, timespec* now);
+
+int __wrap_clock_gettime(clockid_t clock, timespec* now) {
+  const bool isReal = clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE;
+  const bool isBoot = clock == CLOCK_BOOTTIME;
+  const std::int64_t seconds = isReal   ? tavrel::testClock().realtime.load()
+                               : isBoot ? tavrel::testClock().boot.load()
+                                        : 0;
+  if (seconds == 0) return __real_clock_gettime(clock, now);
+  *now = {seconds, 0};
+  return 0;
+}
+}
+
+namespace tavrel {
+
+TestClock& testClock() {
+  static TestClock& clock = shared<TestClock>();
+  return clock;
+}
+
+Recording::Recording() {
+  std::string made = "/dev/shm/tavrel-XXXXXX";
+  root = mkdtemp(made.data());
+  folder = root / "run/tavrel/stat";
+  std::filesystem::create_directories(folder);
+  setenv("TAVREL_ROOT", root.c_str(), 1);
+  testClock().realtime = kToday * 86'400 + 3600;
+  testClock().boot = 0;
+}
+
+Recording::~Recording() {
+  std::filesystem::remove_all(root);
+}
+
+std::vector<std::string> Recording::segments() const {
+  std::vector<std::string> paths;
+  for (const auto& entry : std::filesystem::directory_iterator(folder)) {
+    if (entry.path().extension() == ".segment") paths.push_back(entry.path());
+  }
+  std::sort(paths.begin(), paths.end());
+  return paths;
+}
+
+SegmentWriter Recording::writerOf(const std::string& segment) const {
+  const Descriptor file(open(segment.c_str(), O_RDONLY));
+  return findSegmentWriter(file.get(), SegmentFile(file.get()).facts());
+}
+
+void Recording::fold() {
+  for (const std::string& path : segments()) {
+    const Descriptor file(open(path.c_str(), O_RDONLY));
+    SegmentReader reader(file.get());
+    const bool isGone = findSegmentWriter(file.get(), reader.facts()) == SegmentWriter::Gone;
+    const auto state = reader.state();
+    ASSERT_TRUE(state) << state.error().message;
+    SegmentProgress progress;
+    if (*state == SegmentReader::State::Begun) {
+      std::string& bytes = positions[path];
+      SegmentPosition position;
+      if (!bytes.empty()) position = *SegmentPosition::decode(bytes);
+      progress = reader.read(position, boot, isGone, *this);
+      dropped += progress.dropped;
+      refused += progress.refused;
+      bytes = position.encode();
+    }
+    if (isGone && progress.isComplete) {
+      std::filesystem::remove(path);
+    } else if (!isGone) {
+      const Descriptor writable(open(path.c_str(), O_WRONLY));
+      ASSERT_TRUE(acknowledge(writable.get(), progress));
+    }
+  }
+}
+
+}  // namespace tavrel
