@@ -1,9 +1,9 @@
 #include "daemon/daily_run.h"
 
 #include "base/arithmetic.h"
-#include "config/persisted_state.h"
 #include "daemon/tasking.h"
 #include "platform/guarded.h"
+#include "platform/persisted_state.h"
 #include "report/bh_report.h"
 #include "storage/daily_statistics.h"
 

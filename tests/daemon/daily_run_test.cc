@@ -3,7 +3,7 @@
 #include <gtest/gtest.h>
 #include <limits>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "daemon/entry.h"
 #include "tests/fakes/fake_platform.h"
 

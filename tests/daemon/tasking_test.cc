@@ -3,7 +3,7 @@
 #include <cmath>
 #include <gtest/gtest.h>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

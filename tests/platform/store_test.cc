@@ -16,6 +16,7 @@
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/coding.h"
+#include "platform/store_path.h"
 #include "temporary_root.h"
 
 namespace tavrel {

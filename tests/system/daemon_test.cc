@@ -7,7 +7,7 @@
 #include <sys/un.h>
 
 #include "config/bh_config.h"
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/entry.h"
 #include "platform/linux/files/descriptor.h"

@@ -14,6 +14,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
+#include "platform/persisted_state.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/table.h"
@@ -21,8 +22,6 @@
 
 namespace tavrel {
 namespace {
-
-constexpr std::string_view kServiceName = "com.norvane.tallied.tavrel";
 
 constexpr std::int64_t kAnnounce = 0;
 constexpr std::int64_t kForceDay = 1;
@@ -68,7 +67,7 @@ bool isInteger(const plist::Value& value) {
 }
 
 void send(ToolContext& context, const plist::Dictionary& message, const std::string& done) {
-  auto client = ServiceClient::connect(context.root(), kServiceName);
+  auto client = ServiceClient::connect(context.root(), kTavrelDomain);
   if (!client) return context.fail(client.error().message);
   if (const auto sent = client->send(message); !sent) return context.fail(sent.error().message);
   context.out() << done << '\n';

@@ -5,12 +5,12 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
-#include "config/persisted_state.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/persisted_state.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
 
@@ -40,8 +40,8 @@ DeviceStatus takeStatus(ToolContext& context) {
   LinuxPlatform& device = context.linuxPlatform();
   Platform& platform = device.platform();
   DeviceStatus status;
-  const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
-      "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
+  const bool isAllowed =
+      context.preferences().ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
   if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
   status.today = platform.statistics->BHDaysSince1970();
   bool hasRun = false;
@@ -103,14 +103,17 @@ std::string storeText(const DeviceStatus& status) {
                        dayText(held.lastDay));
 }
 
+std::string submissionText(const DeviceStatus& status) {
+  if (!status.submissionAllowed) return "unknown";
+  if (*status.submissionAllowed) return "allowed";
+  return format("not allowed (allow it with: tavrelctl prefs set %s %s true --bool)",
+                kDiagnosticsDomain, kSubmissionEnabledKey);
+}
+
 void printText(ToolContext& context, const DeviceStatus& status) {
   Table table({{""}, {""}});
   const char* const none = status.isStateReadable ? "none yet" : "unknown";
-  table.add({"Submission", !status.submissionAllowed ? "unknown"
-                           : *status.submissionAllowed
-                               ? "allowed"
-                               : "not allowed (allow it with: tavrelctl prefs set "
-                                 "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)"});
+  table.add({"Submission", submissionText(status)});
   table.add({"Today", dayText(status.today)});
   table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
   table.add({"Last OS version", status.osVersion.value_or(none)});

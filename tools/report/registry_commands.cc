@@ -12,6 +12,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording.h"
+#include "platform/linux/recorded/recording_folder.h"
 #include "platform/linux/recorded/typed_fields.h"
 #include "platform/plist/xml.h"
 #include "platform/report_protocol.h"
@@ -93,7 +94,7 @@ void list(ToolContext& context, const Arguments&) {
   if (context.json()) return context.printJson({{"services", std::move(services)}});
   if (table.empty())
     return context.note("no drivers: recordings of them belong in " +
-                        context.root().path("/var/lib/tavrel/registry"));
+                        context.root().path(kRecordingFolder));
   table.print(context.out(), context.columns());
 }
 

@@ -6,16 +6,13 @@
 #include "base/limits.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/stamp.h"
+#include "platform/persisted_state.h"
 
 namespace tavrel {
 namespace {
 
 constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission";
 constexpr std::string_view kLogEnding = ".log";
-constexpr std::string_view kMetadataEnding = ".metadata.plist";
-constexpr std::string_view kServiceDomain = "com.norvane.zentrix";
-constexpr std::string_view kTaskingDomain = "com.norvane.da";
-constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
 constexpr std::size_t kLongestNamePart = 64;
 
 // Usage of the device is for its owner and for a group of operators.
@@ -73,11 +70,11 @@ FileSubmission::FileSubmission(const DeviceRoot& root, FileSystem& files,
       log_(log) {}
 
 bool FileSubmission::isDiagnosticSubmissionEnabled() {
-  return preferences_.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kServiceDomain);
+  return preferences_.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
 }
 
 bool FileSubmission::hasInternalDiagnostics(std::string_view identifier) {
-  return preferences_.ZTXPreferencesGetBoolValue(identifier, kServiceDomain);
+  return preferences_.ZTXPreferencesGetBoolValue(identifier, kDiagnosticsDomain);
 }
 
 std::string FileSubmission::ZTXOSVersion() {
@@ -113,7 +110,7 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
   const std::string name =
       safeNamePart(logName) + "-" + compactStamp(now) + "-" + randomName().substr(0, 8);
   const std::string logPath = join(folder(Place::Pending), name, kLogEnding);
-  const std::string metadataPath = join(folder(Place::Pending), name, kMetadataEnding);
+  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
 
   Expected<NewFile> file = files_.create(logPath, kMode);
   if (!file) return file.error();
@@ -142,7 +139,7 @@ void FileSubmission::removeOldMetadata(const std::string& freshMetadata) {
   const auto names = files_.list(folder(Place::Pending));
   if (!fresh || !names) return;
   for (const std::string& file : *names) {
-    const std::string name = withoutEnding(file, kMetadataEnding);
+    const std::string name = withoutEnding(file, kLogMetadataEnding);
     if (name.empty() || FileSystem::status(join(folder(Place::Pending), name, kLogEnding)))
       continue;
     const std::string path = join(folder(Place::Pending), file, {});
@@ -164,7 +161,7 @@ void FileSubmission::submitDiagnosticLogs() {
     if (name.empty()) {
       // Metadata follows its log, which stands before it in the list, or went before a process was
       // killed.
-      name = withoutEnding(file, kMetadataEnding);
+      name = withoutEnding(file, kLogMetadataEnding);
       if (!name.empty() && !FileSystem::status(join(folder(Place::Pending), name, kLogEnding)) &&
           FileSystem::status(join(folder(Place::Outbox), name, kLogEnding))) {
         files_.discard(join(folder(Place::Pending), file, {}));
@@ -179,11 +176,11 @@ void FileSubmission::submitDiagnosticLogs() {
 
 Status FileSubmission::moveToOutbox(const std::string& name) {
   const std::string outbox = folder(Place::Outbox);
-  const std::string metadataPath = join(folder(Place::Pending), name, kMetadataEnding);
+  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
   const auto metadata = files_.readIfPresent(metadataPath, limits::kPropertyListBytes);
   if (!metadata) return metadata.error();
   const Status ready =
-      *metadata ? files_.replace(join(outbox, name, kMetadataEnding), asBytes(**metadata), kMode)
+      *metadata ? files_.replace(join(outbox, name, kLogMetadataEnding), asBytes(**metadata), kMode)
                 : files_.makeFolders(outbox);
   if (!ready) return ready;
   return files_.rename(join(folder(Place::Pending), name, kLogEnding),
@@ -198,7 +195,7 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::logs(Place place
     std::string name = withoutEnding(file, kLogEnding);
     if (name.empty()) continue;
     FiledLog log{place, name, join(folder(place), file, {}), {}};
-    if (const auto bytes = files_.readIfPresent(join(folder(place), name, kMetadataEnding),
+    if (const auto bytes = files_.readIfPresent(join(folder(place), name, kLogMetadataEnding),
                                                 limits::kPropertyListBytes);
         bytes && *bytes) {
       if (const auto value = propertyLists_.decode(asBytes(**bytes))) {
