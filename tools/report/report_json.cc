@@ -6,7 +6,6 @@
 
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
-#include "ioreport/state_values.h"
 #include "tools/report/report_selection.h"
 
 namespace tavrel {
