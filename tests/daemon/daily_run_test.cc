@@ -3,8 +3,8 @@
 #include <gtest/gtest.h>
 #include <limits>
 
-#include "platform/persisted_state.h"
 #include "daemon/entry.h"
+#include "platform/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

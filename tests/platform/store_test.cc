@@ -56,7 +56,6 @@ class StoreTest : public testing::Test {
         });
     return rows;
   }
-  std::string contentOf(const std::string& path) { return *files_.read(path, 1U << 24); }
   Rows scalarsOfToday() { return scalars(*store_->initWithDefaultPath(), "", kToday - 1, kToday); }
 
   static std::vector<Sample> take(BHHistoryDistributionEnumerator& values) {
