@@ -65,8 +65,8 @@ CivilTime civilFromSeconds(std::int64_t seconds) {
 std::int64_t secondsFromCivil(const CivilTime& time) {
   // The first day of the 64-bit range is not wholly inside it.
   const auto days = static_cast<std::uint64_t>(daysFromCivil(time.date));
-  return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600 + time.minute * 60 +
-                                   time.second);
+  return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600ULL +
+                                   time.minute * 60ULL + time.second);
 }
 
 unsigned secondOfDay(std::int64_t seconds) {

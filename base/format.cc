@@ -89,7 +89,8 @@ void appendMagnitude(std::string& out, const Directive& directive, Prefix prefix
   char buffer[24];
   char* end = buffer;
   if (magnitude != 0 || directive.precision != 0) {
-    const int base = hexadecimal ? 16 : conversion == 'o' ? 8 : 10;
+    int base = conversion == 'o' ? 8 : 10;
+    if (hexadecimal) base = 16;
     end = std::to_chars(buffer, buffer + sizeof buffer, magnitude, base).ptr;
   }
   if (conversion == 'X') {

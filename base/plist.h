@@ -407,8 +407,8 @@ struct Entry {
   Value value;
 };
 
-template <std::same_as<String> Key>
-void Dictionary::set(const Key& key, Value value) {
+template <std::same_as<String> Key>  // in a template clang-tidy does not see the move
+void Dictionary::set(const Key& key, Value value) {  // NOLINT(performance-unnecessary-value-param)
   setShared(key, std::move(value));
 }
 

@@ -16,10 +16,16 @@ struct Decoded {
   std::size_t length;
 };
 
+/// Of the sequence that a lead byte of 0x80 or more begins.
+std::size_t lengthAfter(unsigned char lead) {
+  if (lead >= 0xF0) return 4;
+  return lead >= 0xE0 ? 3 : 2;
+}
+
 Decoded decode(std::string_view text) {
   const auto lead = static_cast<unsigned char>(text.front());
   if (lead < 0x80) return {lead, 1};
-  const std::size_t length = lead >= 0xF0 ? 4 : lead >= 0xE0 ? 3 : 2;
+  const std::size_t length = lengthAfter(lead);
   if (lead < 0xC2 || lead > 0xF4 || text.size() < length) return {kMalformed, 1};
   char32_t codePoint = lead & (0x7FU >> length);
   for (std::size_t i = 1; i < length; ++i) {

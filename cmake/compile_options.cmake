@@ -3,7 +3,7 @@ add_library(tavrel_options INTERFACE)
 
 # Contraction is off so that every CPU gives the same bits for the same sum.
 target_compile_options(tavrel_options INTERFACE
-  -Wall -Wextra -Wpedantic -Werror
+  -Wall -Wextra -Wpedantic $<$<BOOL:${TAVREL_WERROR}>:-Werror>
   -Wconversion -Wsign-conversion -Wshadow
   $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor;-Woverloaded-virtual;-Wold-style-cast>
   -Wcast-align -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
@@ -25,4 +25,23 @@ if(TAVREL_FUZZ)
   target_compile_options(tavrel_options INTERFACE
     -fsanitize=fuzzer-no-link,address,undefined -fno-sanitize-recover=all)
   target_link_options(tavrel_options INTERFACE -fsanitize=address,undefined)
+endif()
+
+# What distributions harden their programs with. The sanitizers have checks of their own instead.
+# _FORTIFY_SOURCE works only in optimised builds; without a build type a packager's flags say it.
+# Nobody replaces a function of ours, so that position-independent code may be inlined.
+if(TAVREL_HARDENING AND NOT TAVREL_SANITIZE AND NOT TAVREL_FUZZ)
+  set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+  include(CheckPIESupported)
+  check_pie_supported(LANGUAGES CXX)
+  include(CheckCXXCompilerFlag)
+  foreach(flag -fstack-protector-strong -fstack-clash-protection -fcf-protection)
+    string(MAKE_C_IDENTIFIER "TAVREL_HAS${flag}" has)
+    check_cxx_compiler_flag(${flag} ${has})
+    target_compile_options(tavrel_options INTERFACE $<$<BOOL:${${has}}>:${flag}>)
+  endforeach()
+  target_compile_options(tavrel_options INTERFACE
+    -Werror=format-security -fno-semantic-interposition
+    $<$<CONFIG:Release,RelWithDebInfo,MinSizeRel>:-U_FORTIFY_SOURCE;-D_FORTIFY_SOURCE=2>)
+  target_link_options(tavrel_options INTERFACE -Wl,-z,relro,-z,now)
 endif()

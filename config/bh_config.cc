@@ -6,6 +6,7 @@
 #include "base/limits.h"
 #include "base/text.h"
 #include "config/internal_device.h"
+#include "platform/persisted_state.h"
 
 namespace tavrel {
 namespace {
@@ -51,23 +52,25 @@ bool BHConfig::load() {
     return false;
   }
   for (const plist::Entry& group : whitelist->dictionary()) {
-    if (group.key == kInternalTestingGroup && !_isInternalDevice) continue;
-    if (isSwitchedOff(group.key)) {
+    const auto exclusion = exclusionOf(group.key);
+    if (!exclusion) {
+      loadGroup(group.value.dictionary());
+    } else if (exclusion == Exclusion::SwitchedOff) {
       platform_.log->log(LogLevel::Default, "keyGroup %@ is disabled by tasking", group.key);
-      continue;
     }
-    loadGroup(group.value.dictionary());
   }
   scalarPrefixTree_ = treeOf(_scalarPrefixes);
   distributionPrefixTree_ = treeOf(_distributionPrefixes);
   return true;
 }
 
-bool BHConfig::isSwitchedOff(std::string_view group) const {
+std::optional<BHConfig::Exclusion> BHConfig::exclusionOf(std::string_view group) const {
+  if (!_isInternalDevice && group == kInternalTestingGroup) return Exclusion::InternalOnly;
   bool exists = false;
   const bool enabled =
-      platform_.preferences->ZTXPreferencesGetBoolValue(group, kTaskingSwitchDomain, &exists);
-  return exists && !enabled && !_isInternalDevice;
+      platform_.preferences->ZTXPreferencesGetBoolValue(group, kTaskingDomain, &exists);
+  if (exists && !enabled && !_isInternalDevice) return Exclusion::SwitchedOff;
+  return std::nullopt;
 }
 
 void BHConfig::loadGroup(const plist::Dictionary& group) {
@@ -88,7 +91,7 @@ plist::Dictionary BHConfig::configOptionsForDistributionKey(std::string_view key
 plist::Dictionary BHConfig::optionsFor(std::string_view key, const plist::Dictionary& keys,
                                        const plist::Dictionary& prefixes,
                                        const PrefixTree& tree) const {
-  if (const auto exact = keys.dictionary(key)) return exact;
+  if (auto exact = keys.dictionary(key)) return exact;
   if (const auto prefix = tree.longestMatch(key)) {
     platform_.log->log(LogLevel::Debug, "prefix match %@ for %@", *prefix, key);
     return prefixes.dictionary(*prefix);

@@ -4,7 +4,9 @@
 // beginnings of keys, to options. docs/whitelist.md describes it.
 #pragma once
 
+#include <cstdint>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 
@@ -16,9 +18,6 @@ namespace tavrel {
 
 inline constexpr std::string_view kWhitelistPath =
     "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
-
-/// The domain of the boolean preferences that switch whitelist groups off, by group name.
-inline constexpr std::string_view kTaskingSwitchDomain = "com.norvane.da";
 
 /// The group that only internal devices load.
 inline constexpr std::string_view kInternalTestingGroup = "InternalTesting";
@@ -47,6 +46,12 @@ class BHConfig {
   plist::Dictionary configOptionsForScalarKey(std::string_view key) const;
   plist::Dictionary configOptionsForDistributionKey(std::string_view key) const;
 
+  /// Why the daemon does not load a group of this name.
+  enum class Exclusion : std::uint8_t { InternalOnly, SwitchedOff };
+
+  /// Nothing for a group that is loaded.
+  std::optional<Exclusion> exclusionOf(std::string_view group) const;
+
   /// MD5 of the whitelist file's bytes in 32 lower-case hexadecimal digits.
   const std::string& configFileDigest() const { return _configFileDigest; }
 
@@ -54,7 +59,6 @@ class BHConfig {
   explicit BHConfig(Platform& platform);
 
   bool load();
-  bool isSwitchedOff(std::string_view group) const;
   void loadGroup(const plist::Dictionary& group);
   plist::Dictionary optionsFor(std::string_view key, const plist::Dictionary& keys,
                                const plist::Dictionary& prefixes, const PrefixTree& tree) const;

@@ -9,7 +9,7 @@
 #include <memory>
 #include <string_view>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "platform/platform.h"
 
 namespace tavrel {

@@ -3,9 +3,9 @@
 #include <string>
 
 #include "base/arithmetic.h"
-#include "config/persisted_state.h"
 #include "daemon/tasking.h"
 #include "platform/guarded.h"
+#include "platform/persisted_state.h"
 #include "report/bh_report.h"
 #include "storage/daily_statistics.h"
 

@@ -4,7 +4,7 @@
 #include <set>
 #include <string>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 
 namespace tavrel {
 namespace {

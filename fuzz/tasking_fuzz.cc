@@ -6,8 +6,8 @@
 #include <set>
 #include <string>
 
-#include "config/persisted_state.h"
 #include "daemon/tasking.h"
+#include "platform/persisted_state.h"
 #include "platform/plist/coding.h"
 #include "tests/fakes/fake_platform.h"
 

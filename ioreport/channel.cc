@@ -21,8 +21,7 @@ bool identifiesChannel(const plist::Array& legend) {
 
 template <class Make>
 plist::Dictionary createWithLegend(const plist::Array& legend, ErrorOut error, const Make& make) {
-  const plist::Dictionary channel =
-      identifiesChannel(legend) ? madeOrNull(make) : plist::Dictionary();
+  plist::Dictionary channel = identifiesChannel(legend) ? madeOrNull(make) : plist::Dictionary();
   if (!channel) fail(error, kKernelError, "couldn't create channel");
   return channel;
 }
@@ -37,7 +36,7 @@ std::int64_t integerOf(const std::optional<plist::Number>& number) {
 
 plist::Array createLegendChannel(std::uint64_t channelID, std::uint64_t channelType,
                                  std::optional<std::string_view> channelName, ErrorOut error) {
-  const plist::Array legend = madeOrNull([&] {
+  plist::Array legend = madeOrNull([&] {
     plist::Array created = plist::Array::create(3);
     created.append(static_cast<std::int64_t>(channelID));
     created.append(static_cast<std::int64_t>(channelType));
@@ -84,7 +83,11 @@ KernelReturn setChannelType(const plist::Dictionary& channel, std::uint64_t chan
   const auto type = static_cast<std::int64_t>(channelType);
   const bool isSet = madeOrNull([&] {
     plist::Array legend = plist::mutableCopy(published);
-    legend.size() == kLegendType ? legend.append(type) : legend.set(kLegendType, type);
+    if (legend.size() == kLegendType) {
+      legend.append(type);
+    } else {
+      legend.set(kLegendType, type);
+    }
     plist::Dictionary(channel).set(kLegendChannelKey, legend);
     return true;
   });

@@ -6,6 +6,7 @@
 #include "ioreport/allocation.h"
 #include "ioreport/channel.h"
 #include "ioreport/elements.h"
+#include "ioreport/histogram_values.h"
 #include "ioreport/sample_values.h"
 #include "ioreport/state_values.h"
 #include "ioreport/units.h"

@@ -1,8 +1,9 @@
+#include "ioreport/histogram_values.h"
+
 #include "ioreport/allocation.h"
 #include "ioreport/channel.h"
 #include "ioreport/elements.h"
 #include "ioreport/keys.h"
-#include "ioreport/sample_values.h"
 
 namespace tavrel {
 namespace {

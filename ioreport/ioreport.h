@@ -30,15 +30,17 @@
 // operations with "Get" in their names: their results are borrowed from the argument.
 #pragma once
 
-#include "ioreport/aggregate.h"      // IWYU pragma: export
-#include "ioreport/channel.h"        // IWYU pragma: export
-#include "ioreport/delta.h"          // IWYU pragma: export
-#include "ioreport/description.h"    // IWYU pragma: export
-#include "ioreport/discovery.h"      // IWYU pragma: export
-#include "ioreport/error_object.h"   // IWYU pragma: export
-#include "ioreport/iteration.h"      // IWYU pragma: export
-#include "ioreport/sample_values.h"  // IWYU pragma: export
-#include "ioreport/samples.h"        // IWYU pragma: export
-#include "ioreport/selection.h"      // IWYU pragma: export
-#include "ioreport/subscription.h"   // IWYU pragma: export
-#include "ioreport/units.h"          // IWYU pragma: export
+#include "ioreport/aggregate.h"         // IWYU pragma: export
+#include "ioreport/channel.h"           // IWYU pragma: export
+#include "ioreport/delta.h"             // IWYU pragma: export
+#include "ioreport/description.h"       // IWYU pragma: export
+#include "ioreport/discovery.h"         // IWYU pragma: export
+#include "ioreport/error_object.h"      // IWYU pragma: export
+#include "ioreport/histogram_values.h"  // IWYU pragma: export
+#include "ioreport/iteration.h"         // IWYU pragma: export
+#include "ioreport/sample_values.h"     // IWYU pragma: export
+#include "ioreport/samples.h"           // IWYU pragma: export
+#include "ioreport/selection.h"         // IWYU pragma: export
+#include "ioreport/state_values.h"      // IWYU pragma: export
+#include "ioreport/subscription.h"      // IWYU pragma: export
+#include "ioreport/units.h"             // IWYU pragma: export

@@ -103,7 +103,11 @@ IterateResult walkChannels(const PruneWalk& walk, const plist::Array& channels, 
     const plist::Dictionary channel = removal.channel();
     const IterateResult answer = channel ? walk.callback(channel) : kIterateFailed;
     result = combined(result, answer);
-    answer == kIterateRemove ? removal.remove() : removal.keep();
+    if (answer == kIterateRemove) {
+      removal.remove();
+    } else {
+      removal.keep();
+    }
   }
   return result;
 }

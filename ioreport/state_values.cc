@@ -5,7 +5,6 @@
 #include "ioreport/allocation.h"
 #include "ioreport/channel.h"
 #include "ioreport/keys.h"
-#include "ioreport/sample_values.h"
 
 namespace tavrel {
 namespace {

@@ -1,13 +1,39 @@
-// What is worked out over all the states of a channel, for those that need it of many of them.
+// The values of state channels, one element per state. sample_values.h says what is answered for a
+// channel of another format and an index out of range.
 #pragma once
 
 #include <cstddef>
 #include <cstdint>
+#include <optional>
+#include <string_view>
 
 #include "base/plist.h"
 #include "ioreport/elements.h"
 
 namespace tavrel {
+
+/// From the channel's type, whether it is sampled or not.
+std::int32_t IOReportStateGetCount(const plist::Dictionary& channel);
+
+std::int64_t IOReportStateGetIDForIndex(const plist::Dictionary& channel, std::int32_t index);
+/// The last state that has the id.
+std::int32_t IOReportStateGetIndexForID(const plist::Dictionary& channel, std::int64_t stateID);
+
+/// What the state's id spells, borrowed from the channel, which keeps the names of all its states.
+/// Nothing when one of them has no name.
+std::optional<std::string_view> IOReportStateGetNameForIndex(const plist::Dictionary& channel,
+                                                             std::int32_t index);
+
+/// How often the state was entered.
+std::int64_t IOReportStateGetInTransitions(const plist::Dictionary& channel, std::int32_t index);
+/// How long it lasted altogether, unsigned, in the channel's unit.
+std::int64_t IOReportStateGetResidency(const plist::Dictionary& channel, std::int32_t index);
+/// Its residency as a fraction of that of all states.
+double IOReportStateGetDutyCycle(const plist::Dictionary& channel, std::int32_t index);
+/// The state whose element has the latest timestamp, the first of them; -1 when none has any.
+std::int32_t IOReportStateGetCurrent(const plist::Dictionary& channel);
+
+// -- Over all the states of a channel, for those that need it of many of them -------------------
 
 /// The names of all states, which are kept in the channel; an empty handle when one has none.
 plist::Array stateNames(const plist::Dictionary& channel);

@@ -89,10 +89,10 @@ std::optional<std::string_view> IOReportChannelGetUnitLabel(const plist::Diction
 KernelReturn getFactorsFromScale(std::uint32_t factorWord, std::uint32_t scale,
                                  std::uint64_t& numerator, std::uint64_t& denominator) {
   if ((scale >> 16 & 0xFF) != 0) return kKernelBadArgument;
-  std::uint64_t up = 1;
-  std::uint64_t down = 1;
-  const std::uint32_t factor = factorWord & kFactorMask;
-  if (factor != 0) ((factorWord & kFactorDivides) != 0 ? down : up) = factor;
+  const bool divides = (factorWord & kFactorDivides) != 0;
+  const std::uint64_t factor = std::max(factorWord & kFactorMask, 1U);
+  std::uint64_t up = divides ? 1 : factor;
+  std::uint64_t down = divides ? factor : 1;
 
   const int tens = exponentOf(scale & 0xFF);
   up = timesPowerOfTen(up, tens);

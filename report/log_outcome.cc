@@ -4,7 +4,7 @@
 #include <iterator>
 
 #include "config/bh_config.h"
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 
 namespace tavrel {
 namespace {

@@ -8,6 +8,7 @@
 #include "base/bytes.h"
 #include "base/format.h"
 #include "platform/statistics_store.h"
+#include "platform/store_path.h"
 #include "report/bh_report.h"
 #include "report/faultline_preferences.h"
 
@@ -20,7 +21,6 @@ constexpr std::string_view kDatabaseSizeKey = "com.norvane.zentrix.bhd.database.
 constexpr std::string_view kCorruptionsKey = "com.norvane.zentrix.bhd.database.corruptions";
 constexpr std::string_view kUptimeKey = "com.norvane.usage.cur_boot_session_cpu_uptime";
 
-constexpr const char* kHomeDirectory = "/var/mobile";
 constexpr std::int64_t kBytesPerMiB = 1048576;
 
 /// A scalar that is read from a system control: its name, how long its value is in bytes (the
@@ -86,8 +86,7 @@ void BHReport::addMetadataKeys() {
 
 void BHReport::reportDatabaseSize() {
   addScalarForKey(kDatabaseSizeKey, [this]() -> std::int64_t {
-    const std::string path = format("%s/Library/Brimhold/BHDataStore.sqlitedb", kHomeDirectory);
-    const auto bytes = platform_.files->size(path);
+    const auto bytes = platform_.files->size(kStorePath);
     return bytes ? *bytes / kBytesPerMiB : -1;
   });
   addScalarForKey(kCorruptionsKey, [this] { return takeCorruptionCount(); });

@@ -1,7 +1,7 @@
 #include <string>
 
 #include "base/utf8.h"
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "report/bh_report.h"
 
 namespace tavrel {
@@ -19,7 +19,7 @@ std::optional<std::string_view> terminatedText(ByteSpan bytes) {
   return terminated;
 }
 
-plist::Value orDefault(plist::Value value, plist::Value fallback) {
+plist::Value orDefault(const plist::Value& value, const plist::Value& fallback) {
   return value.isNull() ? fallback : value;
 }
 

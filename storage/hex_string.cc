@@ -25,8 +25,10 @@ std::uint8_t hexStringToByte(StandardStreams& streams, std::string_view text) {
 std::uint32_t hexStringToInt32(StandardStreams& streams, std::string_view text) {
   text = text.substr(0, 8);
   std::uint32_t number = 0;
-  for (; !text.empty(); text.remove_prefix(std::min<std::size_t>(2, text.size())))
+  while (!text.empty()) {
     number = number << 8 | hexStringToByte(streams, text);
+    text.remove_prefix(std::min<std::size_t>(2, text.size()));
+  }
   return number;
 }
 

@@ -24,7 +24,9 @@ using namespace binary;
 
 // The narrowest of 1, 2, 4 and 8 bytes.
 std::size_t widthOf(std::uint64_t word) {
-  return word <= 0xFF ? 1 : word <= 0xFFFF ? 2 : word <= 0xFFFFFFFF ? 4 : 8;
+  if (word <= 0xFF) return 1;
+  if (word <= 0xFFFF) return 2;
+  return word <= 0xFFFFFFFF ? 4 : 8;
 }
 
 void appendWord(std::string& out, std::uint64_t word, std::size_t width) {

@@ -244,11 +244,10 @@ void XmlReader::startElement(std::string_view name) {
 }
 
 void XmlReader::startValue(Element element, std::string_view name) {
-  if (containers_.empty()
-          ? !root_.isNull()
-          : containers_.back().element == Element::Dict && !containers_.back().hasKey) {
-    return fail("<" + excerpt(name) +
-                (containers_.empty() ? "> is a second value" : "> stands where <key> should"));
+  if (containers_.empty()) {
+    if (!root_.isNull()) return fail("<" + excerpt(name) + "> is a second value");
+  } else if (containers_.back().element == Element::Dict && !containers_.back().hasKey) {
+    return fail("<" + excerpt(name) + "> stands where <key> should");
   }
   if (++values_ > limits::kPropertyListValues) {
     return fail(format("there are more than %zu values", limits::kPropertyListValues));

@@ -33,8 +33,8 @@ TEST(AppInfoTest, ConvertsElementsInOrderAndLeavesIncompleteOnesOut) {
   full.set("other", "dropped");
   Dictionary withoutVersion = app(kUuid);
   withoutVersion.remove("version");
-  const Array entries = appInfoFrom(
-      {full, "no dictionary", withoutVersion, app("bad"), app(uuidBytes(15)), app(16), app(kUuid)});
+  const Array entries = appInfoFrom({full, "no dictionary", withoutVersion, app("bad"),
+                                     app(uuidBytes(15)), app(uuidBytes(17)), app(16), app(kUuid)});
   EXPECT_EQ(entries, (Array{Dictionary{{"bundle", "com.example.walk"},
                                        {"version", "1.2"},
                                        {"orboID", std::int64_t{-9223372036854775807}},

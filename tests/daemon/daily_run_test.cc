@@ -5,8 +5,8 @@
 #include <limits>
 
 #include "base/version.h"
-#include "config/persisted_state.h"
 #include "daemon/entry.h"
+#include "platform/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

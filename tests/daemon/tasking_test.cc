@@ -3,7 +3,7 @@
 #include <cmath>
 #include <gtest/gtest.h>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {
@@ -107,13 +107,16 @@ TEST_F(TaskingTest, AppliesNothingThatItCouldNotUndo) {
        {Case(plist::Date::sinceEpoch(std::nan("")),
              "cannot encode the property list, value /TaskingPayload/0/Value: no calendar reaches "
              "the date"),
-        Case(std::string(1 << 20, 'x'), "it needs 1048894 bytes and may have 1048576")}) {
+        Case(std::string(1048259, 'x'), "it needs 1048577 bytes and may have 1048576")}) {
     schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", value)}}});
     EXPECT_EQ(track(), Journal{});
     EXPECT_EQ(fake.log.messages(),
               Messages{"cannot apply ScheduledTasking of domain com.norvane.Drovelink: " + why +
                        "; schedule one that preferences can hold"});
   }
+  const std::string most(1048258, 'x');
+  schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", most)}}});
+  EXPECT_EQ(track().back(), "post com.norvane.da.tasking_changed");
 }
 
 TEST_F(TaskingTest, SynchronisesEachDomainOnce) {

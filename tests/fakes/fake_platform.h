@@ -3,6 +3,7 @@
 #pragma once
 
 #include <deque>
+#include <exception>
 #include <map>
 #include <optional>
 #include <set>
@@ -286,7 +287,10 @@ struct FakeServices : NamedServices {
 
 /// Dates in UTC, whatever the pattern.
 struct FakeDateFormatting : DateFormatting {
+  std::exception_ptr raises;
+
   std::string format(plist::Date date, std::string_view, std::string_view) override {
+    if (raises) std::rethrow_exception(raises);
     return textOf(plist::Value(date));
   }
 };

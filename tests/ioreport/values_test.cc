@@ -184,9 +184,9 @@ TEST(UnitTest, LabelsQuantitiesAndScales) {
   for (const std::uint64_t code :
        {std::uint64_t{0}, unit(1, 0x7C), unit(7, 0x7C, 1), unit(9, 0), unit(9, 0, 1),
         unit(9, 0x8200), unit(9, 0x8C00, 4), unit(101, 0x82), unit(11, 0x89 << 8),
-        unit(1, 0x79, 0x80000018), unit(77, 0x20000)})
+        unit(1, 0x79, 0x80000018), unit(77, 0x20000), unit(77, 0x820000)})
     labels += copyUnitLabel(static_cast<std::int64_t>(code)).value_or("none") + "|";
-  EXPECT_EQ(labels, "|ms|H|b||B|4KiB|kpackets|Ki??|24Mticks|hwpage?|");
+  EXPECT_EQ(labels, "|ms|H|b||B|4KiB|kpackets|Ki??|24Mticks|hwpage?|??|");
   EXPECT_EQ(copyUnitLabel(kNone), std::nullopt);
 
   const Dictionary channel{{"IOReportChannelInfo", IOReportCreateUnitInfo(unit(1, 0x7C))}};

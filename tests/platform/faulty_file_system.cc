@@ -4,20 +4,16 @@
 #include <fcntl.h>
 #include <filesystem>
 #include <fstream>
-#include <iterator>
 #include <set>
 #include <sys/stat.h>
 #include <unistd.h>
+
+#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
 
 namespace fs = std::filesystem;
-
-std::string contentOf(const fs::path& path) {
-  std::ifstream file(path, std::ios::binary);
-  return {std::istreambuf_iterator<char>(file), {}};
-}
 
 std::uint64_t inodeOf(const fs::path& path) {
   struct stat status {};

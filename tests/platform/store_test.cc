@@ -16,6 +16,7 @@
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/coding.h"
+#include "platform/store_path.h"
 #include "temporary_root.h"
 
 namespace tavrel {
@@ -55,7 +56,6 @@ class StoreTest : public testing::Test {
         });
     return rows;
   }
-  std::string contentOf(const std::string& path) { return *files_.read(path, 1U << 24); }
   Rows scalarsOfToday() { return scalars(*store_->initWithDefaultPath(), "", kToday - 1, kToday); }
 
   static std::vector<Sample> take(BHHistoryDistributionEnumerator& values) {
@@ -554,8 +554,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   const std::string where = "statistics store " + store_->path() + ": ";
   const std::string advice =
       " (Permission denied): check owner and permissions of the file and its folder";
-  const std::string waits =
-      "; 1 value is not kept yet: cannot write " + store_->path() + "-kept: ";
+  const std::string waits = "; 1 value is not kept yet: cannot write " + store_->path() + "-kept: ";
   const std::string denied = "Permission denied; run as root or as the owner of the files";
   // There is no room for a single byte more.
   const auto full = [] {

@@ -7,6 +7,7 @@
 #include <fstream>
 #include <functional>
 #include <gtest/gtest.h>
+#include <iterator>
 #include <stdlib.h>
 #include <string>
 #include <string_view>
@@ -20,6 +21,11 @@
 namespace tavrel {
 
 using Lines = std::vector<std::string>;
+
+inline std::string contentOf(const std::filesystem::path& path) {
+  std::ifstream file(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(file), {}};
+}
 
 /// Removed with everything in it at the end.
 class TemporaryRoot {

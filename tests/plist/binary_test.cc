@@ -5,6 +5,7 @@
 #include <string>
 #include <vector>
 
+#include "base/format.h"
 #include "platform/plist/coding.h"
 #include "platform/plist/xml.h"
 
@@ -13,23 +14,22 @@ namespace {
 
 using namespace std::string_literals;
 
-// A document of objects given as bytes, with references of one byte and offsets of one or two; the
-// first object is the root and stands at offset 8.
+// A document of objects given as bytes, with references of one byte and offsets of some; the first
+// object is the root and stands at offset 8.
 std::string document(const std::vector<std::string>& objects, std::size_t offsetWidth = 1) {
   std::string out = "bplist00";
-  std::string table;
-  const auto appendOffset = [&](std::string& to) {
-    if (offsetWidth == 2) to += static_cast<char>(out.size() >> 8);
-    to += static_cast<char>(out.size() & 0xFF);
+  const auto appendOffset = [&out](std::string& to, std::size_t width) {
+    for (std::size_t i = width; i-- > 0;)
+      to += static_cast<char>(out.size() >> (8 * i) & 0xFF);
   };
+  std::string table;
   for (const std::string& object : objects) {
-    appendOffset(table);
+    appendOffset(table, offsetWidth);
     out += object;
   }
   std::string trailer = "\0\0\0\0\0\0"s + static_cast<char>(offsetWidth) + '\1';
-  trailer +=
-      "\0\0\0\0\0\0\0"s + static_cast<char>(objects.size()) + std::string(16 - offsetWidth, '\0');
-  appendOffset(trailer);
+  trailer += "\0\0\0\0\0\0\0"s + static_cast<char>(objects.size()) + std::string(8, '\0');
+  appendOffset(trailer, 8);
   return out + table + trailer;
 }
 
@@ -41,7 +41,8 @@ std::string errorOf(const std::string& bytes) {
 TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
   using Case = std::pair<Value, std::string>;
   for (const auto& [value, object] :
-       {Case(true, "\x09"s), Case(std::int8_t{7}, "\x10\x07"s), Case(256, "\x11\x01\x00"s),
+       {Case(true, "\x09"s), Case(std::int8_t{7}, "\x10\x07"s), Case(0xFF, "\x10\xFF"s),
+        Case(256, "\x11\x01\x00"s), Case(0xFFFF, "\x11\xFF\xFF"s),
         Case(0xFFFFFFFF, "\x12\xFF\xFF\xFF\xFF"s),
         Case(std::uint64_t{1} << 63, "\x14\0\0\0\0\0\0\0\0\x80\0\0\0\0\0\0\0"s),
         Case(1.5F, "\x22\x3F\xC0\0\0"s), Case(-0.0, "\x23\x80\0\0\0\0\0\0\0"s),
@@ -128,6 +129,10 @@ TEST(Binary, HostileObjectsAreRefused) {
   for (const auto& [objects, error] : rows)
     EXPECT_EQ(errorOf(document(objects)), "binary property list, offset " + error);
 
+  // As many values as there may be: the root, 9 arrays, and all that is in them.
+  const std::string large = "\xAF\x12\x00\x01\xB2\x06"s + std::string(111'110, '\1');
+  EXPECT_EQ(errorOf(document({"\xA9"s + std::string(9, '\2'), "\x09", large}, 4)), "no error");
+
   std::vector<std::string> nested;
   for (int i = 1; i < 129; ++i)
     nested.push_back("\xA1"s + static_cast<char>(i));
@@ -144,12 +149,14 @@ TEST(Binary, HostileTrailersAreRefused) {
   const std::tuple<std::size_t, std::string, std::string> rows[] = {
       {0, "bplist15", "0: it does not begin with \"bplist00\""},
       {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},
+      {16, "\x09", "16: 9 is no width from 1 to 8 bytes"},
       {16, "\2"s, "18: the table of offsets has no room for 1 objects"},
       {18, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "18: the table of offsets has no room for 18446744073709551615 objects"},
       {26, "\0\0\0\0\0\0\0\1"s, "26: a reference to object 1, where there are 1"},
       {34, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "34: the table of offsets begins at 18446744073709551615, outside the document"},
+      {34, "\0\0\0\0\0\0\0\x0A"s, "18: the table of offsets has no room for 1 objects"},
       {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"}};
   for (const auto& [at, change, error] : rows) {
     std::string bytes = good;
@@ -161,20 +168,19 @@ TEST(Binary, HostileTrailersAreRefused) {
 }
 
 TEST(Binary, ContentThatIsReferredToManyTimesIsLimited) {
-  // One mebibyte of data, or of text, referred to 65 times.
-  std::string bytes = "bplist00\xAF\x10\x41"s + std::string(65, '\1') + "\x4F\x12\x00\x10\x00\x00"s;
-  const std::size_t data = 8 + 3 + 65;
-  bytes += std::string(std::size_t{1} << 20, 'x');
-  const std::size_t table = bytes.size();
-  bytes += "\0\0\0\x08\0\0\0"s + static_cast<char>(data) + "\0\0\0\0\0\0\4\1"s;
-  bytes += "\0\0\0\0\0\0\0\2\0\0\0\0\0\0\0\0\0\0\0\0\0"s;
-  for (const unsigned shift : {16U, 8U, 0U})
-    bytes += static_cast<char>(table >> shift & 0xFF);
-  for (const char marker : {'\x4F', '\x5F'}) {
-    bytes[data] = marker;
-    EXPECT_EQ(errorOf(bytes),
-              "binary property list, offset 76: texts and data, after shared references are "
-              "expanded, are more than 67108864 bytes");
+  // One mebibyte of data, or of text, referred to 65 times; the value of all keys is `false`.
+  const std::string references(65, '\1');
+  const std::tuple<std::string, char, int> rows[] = {
+      {"\xAF\x10\x41" + references, '\x4F', 76},
+      {"\xAF\x10\x41" + references, '\x5F', 76},
+      {"\xDF\x10\x41" + references + std::string(65, '\2'), '\x5F', 75}};
+  for (const auto& [root, marker, offset] : rows) {
+    const std::string content =
+        marker + "\x12\x00\x10\x00\x00"s + std::string(std::size_t{1} << 20, 'x');
+    EXPECT_EQ(errorOf(document({root, content, "\x08"}, 4)),
+              format("binary property list, offset %d: texts and data, after shared references "
+                     "are expanded, are more than 67108864 bytes",
+                     offset));
   }
   EXPECT_FALSE(writeBinary(Dictionary{{std::string(33 << 20, 'k'), std::string(33 << 20, 'k')}}));
 }

@@ -62,6 +62,7 @@ TEST(Xml, ScalarsAreWrittenAndReadBack) {
         Case(Date::ofDay(std::numeric_limits<std::int32_t>::min()),
              "<date>-5877641-06-23T00:00:00Z</date>"),
         Case(Data(asBytes("ab")), "<data>\nYWI=\n</data>"),
+        Case(Data(asBytes("a")), "<data>\nYQ==\n</data>"),
         Case(Data(ByteSpan()), "<data>\n</data>"), Case(" \t\n\r ", "<string> \t\n&#13; </string>"),
         Case("\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>")}) {
     const auto xml = writeXml(value);

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "report/histogram.h"
 #include "tests/fakes/fake_platform.h"
 

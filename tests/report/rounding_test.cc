@@ -24,13 +24,26 @@ TEST(RoundingTest, RoundsToBuckets) {
 // so many that the power is no longer finite, or none.
 TEST(RoundingTest, KeepsSignificantFigures) {
   using Case = std::tuple<std::uint32_t, std::int64_t, std::int64_t>;
-  for (const auto& [figures, value, rounded] :
-       {Case(2, 12345, 12000), Case(2, -12345, -12000), Case(2, 999, 1000), Case(2, 1049, 1000),
-        Case(2, 1050, 1100), Case(4, 12355, 12360), Case(1, 150, 200), Case(1, 7, 7),
-        Case(0, 7, 10), Case(0, 1, 1), Case(0, 3, 0), Case(5, 12345, 12345),
-        Case(1, kLargest, 9000000000000000000), Case(1, kSmallest, -9000000000000000000),
-        Case(0, kLargest, kLargest), Case(0, kSmallest, kSmallest), Case(4294967295, 12345, 0),
-        Case(2147483664, 12345, 0), Case(2147483647, 12345, 12345)}) {
+  for (const auto& [figures, value, rounded] : {Case(2, 12345, 12000),
+                                                Case(2, -12345, -12000),
+                                                Case(2, 999, 1000),
+                                                Case(2, 1049, 1000),
+                                                Case(2, 1050, 1100),
+                                                Case(4, 12355, 12360),
+                                                Case(1, 150, 200),
+                                                Case(1, 7, 7),
+                                                Case(0, 7, 10),
+                                                Case(0, 1, 1),
+                                                Case(0, 3, 0),
+                                                Case(5, 12345, 12345),
+                                                Case(1, kLargest, 9000000000000000000),
+                                                Case(1, kSmallest, -9000000000000000000),
+                                                Case(0, kLargest, kLargest),
+                                                Case(0, kSmallest, kSmallest),
+                                                Case(4294967295, 12345, 0),
+                                                Case(2147483664, 12345, 0),
+                                                Case(2147483647, 12345, 12345),
+                                                Case(16, 9007199254740993, 9007199254740993)}) {
     EXPECT_EQ(roundToSignificantFigures(value, figures), rounded) << value << " to " << figures;
   }
 }

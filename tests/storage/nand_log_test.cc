@@ -80,27 +80,12 @@ TEST_F(NandLog, WaitsAWeekWhateverTheSubmissionSaid) {
       "Faultline Key: error\n\n2026-11-23 18:02:18 +0000 tavrel[211]: \n"));
 }
 
-struct RaisingFormatting : DateFormatting {
-  bool ofPlatform = true;
-  std::string format(plist::Date, std::string_view, std::string_view) override {
-    if (ofPlatform) throw PlatformException("RangeException");
-    throw std::runtime_error("of another kind");
-  }
-};
-
 TEST_F(NandLog, CatchesTheExceptionsOfThePlatformOnly) {
-  RaisingFormatting raising;
-  auto& [applications, clock, crashes, dates, answers, digest, drivers, loader, loop, files, locale,
-         log, services, notifications, stored, process, lists, snapshots, streams, statistics,
-         submission, controls, version, state] = fake.platform;
-  Platform platform{applications, clock,         crashes,    raising,  answers, digest,
-                    drivers,      loader,        loop,       files,    locale,  log,
-                    services,     notifications, stored,     process,  lists,   snapshots,
-                    streams,      statistics,    submission, controls, version, state};
-  NLW_WriteLog(platform, "165", none);
+  fake.dateFormatting.raises = std::make_exception_ptr(PlatformException("RangeException"));
+  write(none);
   EXPECT_EQ(fake.log.messages(), fakes::Journal{"An exception occurred: RangeException"});
-  raising.ofPlatform = false;
-  EXPECT_THROW(NLW_WriteLog(platform, "165", none), std::runtime_error);
+  fake.dateFormatting.raises = std::make_exception_ptr(std::runtime_error("of another kind"));
+  EXPECT_THROW(write(none), std::runtime_error);
   EXPECT_TRUE(fake.journal.empty());
 }
 

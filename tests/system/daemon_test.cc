@@ -3,20 +3,18 @@
 #include <array>
 #include <filesystem>
 #include <sstream>
-#include <sys/socket.h>
-#include <sys/un.h>
 
 #include "config/bh_config.h"
-#include "config/persisted_state.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/entry.h"
-#include "platform/linux/files/descriptor.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
+#include "platform/linux/service/service_socket.h"
 #include "platform/linux/store/sqlite_batch.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/persisted_state.h"
 #include "platform/plist/xml.h"
 #include "tests/fakes/plist_matching.h"
 #include "tests/platform/temporary_root.h"
@@ -149,12 +147,6 @@ struct Device {
     ::execl(TAVREL_BINARY, "tavrel", argument, nullptr);
     ::_exit(127);
   }
-
-  static std::string contentOf(const std::string& path) {
-    std::ostringstream content;
-    content << std::ifstream(path).rdbuf();
-    return content.str();
-  }
 };
 
 TEST(DaemonTest, RunsOnceADayAndByForce) {
@@ -199,8 +191,13 @@ TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
     const int daemon = forkProcess([&] {
       int gone[2];  // a pipe whose reader has gone
       if (::pipe(gone) != 0 || ::close(gone[0]) != 0) ::_exit(126);
-      for (const int stream : {0, 1, 2})
-        areClosed ? ::close(stream) : ::dup2(gone[1], stream);
+      for (const int stream : {0, 1, 2}) {
+        if (areClosed) {
+          ::close(stream);
+        } else {
+          ::dup2(gone[1], stream);
+        }
+      }
       ::close(gone[1]);
       device.execute("-d");
     });
@@ -211,24 +208,12 @@ TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
   }
 }
 
-/// A listening socket as the service manager would hand it over.
-int listeningSocket(const DeviceRoot& root) {
-  const std::filesystem::path path = root.path("/run/tavrel/com.norvane.tallied.tavrel.socket");
-  std::filesystem::create_directories(path.parent_path());
-  sockaddr_un address{};
-  address.sun_family = AF_UNIX;
-  path.string().copy(address.sun_path, sizeof address.sun_path - 1);
-  const int listener = ::socket(AF_UNIX, SOCK_SEQPACKET, 0);
-  EXPECT_EQ(::bind(listener, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-  EXPECT_EQ(::listen(listener, 8), 0);
-  return listener;
-}
-
 TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
   const Device device;
-  const Descriptor listener(listeningSocket(device.root));
+  const auto listener = ServiceSocket::open(device.root, kTavrelDomain);
+  ASSERT_TRUE(listener);
   const int daemon = forkProcess([&] {
-    ::dup2(listener.get(), 3);
+    ::dup2(listener->get(), 3);
     ::setenv("LISTEN_FDS", "1", 1);
     ::setenv("LISTEN_PID", std::to_string(::getpid()).c_str(), 1);
     device.execute(nullptr);

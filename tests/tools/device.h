@@ -6,11 +6,11 @@
 #include <fstream>
 #include <gtest/gtest.h>
 #include <sstream>
-#include <stdlib.h>
 #include <string>
 #include <vector>
 
 #include "platform/plist/xml.h"
+#include "tests/platform/temporary_root.h"
 #include "tools/shared/json_value.h"
 #include "tools/tavrelctl.h"
 
@@ -48,31 +48,15 @@ inline Outcome fails(const std::string& error, int status = 1) {
   return {status, {}, "tavrelctl: " + error + "\n"};
 }
 
-class TemporaryDevice {
+class TemporaryDevice : public TemporaryRoot {
  public:
-  TemporaryDevice() {
-    std::string name = (std::filesystem::temp_directory_path() / "tavrel-device-XXXXXX").string();
-    root_ = ::mkdtemp(name.data());
-  }
-  ~TemporaryDevice() { std::filesystem::remove_all(root_); }
-  TemporaryDevice(const TemporaryDevice&) = delete;
-  TemporaryDevice& operator=(const TemporaryDevice&) = delete;
-
-  std::string path(const std::string& devicePath) const { return root_.string() + devicePath; }
-
-  void write(const std::string& devicePath, const std::string& content) const {
-    std::filesystem::create_directories(std::filesystem::path(path(devicePath)).parent_path());
-    std::ofstream(path(devicePath), std::ios::binary) << content;
-  }
+  std::string path(std::string_view devicePath) const { return root.path(devicePath); }
 
   /// Every file below the root with its content, so that "nothing has changed" can be seen.
   std::vector<std::pair<std::string, std::string>> files() const {
     std::vector<std::pair<std::string, std::string>> list;
-    for (const auto& entry : std::filesystem::recursive_directory_iterator(root_)) {
-      if (!entry.is_regular_file()) continue;
-      std::ostringstream content;
-      content << std::ifstream(entry.path(), std::ios::binary).rdbuf();
-      list.emplace_back(entry.path().string(), content.str());
+    for (const auto& entry : std::filesystem::recursive_directory_iterator(path(""))) {
+      if (entry.is_regular_file()) list.emplace_back(entry.path(), contentOf(entry.path()));
     }
     std::sort(list.begin(), list.end());
     return list;
@@ -80,7 +64,7 @@ class TemporaryDevice {
 
   Outcome run(std::vector<std::string> arguments, const std::string& input = {},
               std::optional<std::size_t> columns = std::nullopt) const {
-    return runAt(root_.string(), std::move(arguments), input, columns);
+    return runAt(path(""), std::move(arguments), input, columns);
   }
 
   static Outcome runAt(const std::string& root, std::vector<std::string> arguments,
@@ -94,9 +78,6 @@ class TemporaryDevice {
         runTavrelctl(arguments, {.in = in, .out = out, .error = error, .columns = columns});
     return {status, out.str(), error.str()};
   }
-
- private:
-  std::filesystem::path root_;
 };
 
 }  // namespace tavrel

@@ -17,9 +17,7 @@ using plist::Value;
 constexpr const char* kRecording = "/var/lib/tavrel/registry/report.plist";
 
 std::string example() {
-  std::ostringstream content;
-  content << std::ifstream(TAVREL_EXAMPLES "/registry/report.plist").rdbuf();
-  return content.str();
+  return contentOf(TAVREL_EXAMPLES "/registry/report.plist");
 }
 
 class ReportTest : public testing::Test {

@@ -5,12 +5,12 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
-#include "config/persisted_state.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/persisted_state.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
@@ -42,8 +42,8 @@ DeviceStatus takeStatus(ToolContext& context) {
   LinuxPlatform& device = context.linuxPlatform();
   Platform& platform = device.platform();
   DeviceStatus status;
-  const bool isAllowed = context.preferences().ZTXPreferencesGetBoolValue(
-      "DiagnosticSubmissionEnabled", "com.norvane.zentrix");
+  const bool isAllowed =
+      context.preferences().ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
   if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
   status.today = platform.statistics->BHDaysSince1970();
   bool hasRun = false;
@@ -80,7 +80,10 @@ Json jsonOfDay(std::optional<std::int32_t> day) {
 }
 
 void printJson(ToolContext& context, const DeviceStatus& status) {
-  Json store = {{"path", status.storePath}, {"bytes", nullptr}, {"first_day", nullptr}, {"last_day", nullptr}};
+  Json store = {{"path", status.storePath},
+                {"bytes", nullptr},
+                {"first_day", nullptr},
+                {"last_day", nullptr}};
   if (status.storeBytes) store["bytes"] = *status.storeBytes;
   if (status.days && *status.days) {
     store["first_day"] = jsonOfDay((*status.days)->first);
@@ -107,16 +110,18 @@ std::string storeText(const DeviceStatus& status) {
   return text + format(", days %s to %s", dayText(first), dayText(last));
 }
 
+Table::Cell submissionCell(const DeviceStatus& status) {
+  if (!status.submissionAllowed) return {"unknown", Emphasis::Alarm};
+  if (*status.submissionAllowed) return {"allowed"};
+  return {format("not allowed (allow it with: tavrelctl prefs set %s %s true --bool)",
+                 kDiagnosticsDomain, kSubmissionEnabledKey),
+          Emphasis::Alarm};
+}
+
 void printText(ToolContext& context, const DeviceStatus& status) {
   Table table({{""}, {""}});
   const char* const none = status.isStateReadable ? "none yet" : "unknown";
-  table.add({"Submission",
-             !status.submissionAllowed ? Table::Cell("unknown", Emphasis::Alarm)
-             : *status.submissionAllowed
-                 ? Table::Cell("allowed")
-                 : Table::Cell("not allowed (allow it with: tavrelctl prefs set "
-                               "com.norvane.zentrix DiagnosticSubmissionEnabled true --bool)",
-                               Emphasis::Alarm)});
+  table.add({"Submission", submissionCell(status)});
   table.add({"Today", dayText(status.today)});
   table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
   table.add({"Last OS version", status.osVersion.value_or(none)});

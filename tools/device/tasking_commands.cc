@@ -9,9 +9,9 @@
 #include <utility>
 #include <vector>
 
-#include "config/persisted_state.h"
 #include "daemon/tasking.h"
 #include "platform/linux/preferences/file_preferences.h"
+#include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/device/tasking_document.h"
 #include "tools/shared/input_file.h"

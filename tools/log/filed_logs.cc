@@ -119,8 +119,8 @@ void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs
   const auto isBare = [](const FiledLog& log) { return log.metadata.empty(); };
   const auto first = std::find_if(logs.begin(), logs.end(), isBare);
   if (first == logs.end()) return;
-  const std::string path =
-      first->path.substr(0, first->path.rfind('/') + 1) + first->name + ".metadata.plist";
+  const std::string path = first->path.substr(0, first->path.rfind('/') + 1) + first->name +
+                           std::string(kLogMetadataEnding);
   const auto bytes = context.linuxPlatform().fileSystem().read(path, limits::kPropertyListBytes);
   const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
   std::string reason = value ? path + ": it is empty or no dictionary" : value.error().message;

@@ -3,7 +3,7 @@
 #include <nlohmann/json.hpp>
 
 #include "base/arithmetic.h"
-#include "config/persisted_state.h"
+#include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
 

@@ -8,6 +8,8 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/recorded/recorded_snapshots.h"
+#include "platform/linux/recorded/recording_folder.h"
 #include "platform/platform.h"
 #include "storage/counter_parsers.h"
 #include "storage/nand_exporters.h"
@@ -72,7 +74,7 @@ void info(ToolContext& context, const Arguments& arguments) {
   const std::string advice = hasDriver
                                  ? "see what the driver answers with 'tavrelctl registry show ID'"
                                  : format("put a recording of the storage driver into %s",
-                                          context.root().path("/var/lib/tavrel/registry"));
+                                          context.root().path(kRecordingFolder));
   context.fail(format("no NAND information: %s: %s",
                       info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
 }
@@ -206,7 +208,7 @@ void freezer(ToolContext& context, const Arguments& arguments) {
   context.fail(
       format("no freezer writes: %s: put a stack snapshot that holds the thread "
              "VM_swapout at %s",
-             message, context.root().path("/var/lib/tavrel/registry/stack-snapshot.bin")));
+             message, context.root().path(kRecordedSnapshot)));
 }
 
 void build(ToolContext& context, const Arguments& arguments) {
@@ -240,7 +242,11 @@ void addNandCommands(Command app, ToolContext& context) {
       .typeName("FILE2");
   context.addJsonOption(parseCommand);
   parseCommand.onRun([&context, arguments] {
-    arguments->other.empty() ? parse(context, *arguments) : compare(context, *arguments);
+    if (arguments->other.empty()) {
+      parse(context, *arguments);
+    } else {
+      compare(context, *arguments);
+    }
   });
 
   const Command countersCommand =

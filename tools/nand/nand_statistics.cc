@@ -170,7 +170,12 @@ std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
   std::vector<std::pair<std::size_t, StatisticDifference>> found;
   auto a = first.begin(), b = second.begin();
   while (a != first.end() || b != second.end()) {
-    const int order = a == first.end() ? 1 : b == second.end() ? -1 : a->name.compare(b->name);
+    int order = 1;
+    if (b == second.end()) {
+      order = -1;
+    } else if (a != first.end()) {
+      order = a->name.compare(b->name);
+    }
     if (order < 0) {
       found.push_back({a->position, {a->name, a->value, std::nullopt}});
     } else if (order > 0) {

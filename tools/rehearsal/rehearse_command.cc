@@ -272,9 +272,9 @@ void addRehearseCommand(Command app, ToolContext& context) {
                   "Show every event, debug messages and the content of logs");
   context.addJsonOption(command);
   command.onRun([&context, arguments] {
-    const RehearsedRun run = arguments->today    ? RehearsedRun::Today
-                             : arguments->forced ? RehearsedRun::Forced
-                                                 : RehearsedRun::Gated;
+    RehearsedRun run = RehearsedRun::Gated;
+    if (arguments->forced) run = RehearsedRun::Forced;
+    if (arguments->today) run = RehearsedRun::Today;
     const Rehearsal rehearsal = rehearse(context.linuxPlatform(), run);
     if (context.json()) {
       context.printJson(documentOf(rehearsal, run));

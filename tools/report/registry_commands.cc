@@ -12,6 +12,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording.h"
+#include "platform/linux/recorded/recording_folder.h"
 #include "platform/linux/recorded/typed_fields.h"
 #include "platform/plist/xml.h"
 #include "platform/report_protocol.h"
@@ -95,7 +96,7 @@ void list(ToolContext& context, const Arguments&) {
     // Recordings that cannot be read have been complained of.
     if (context.hasComplaints()) return;
     context.out() << "no drivers: recordings of them belong in "
-                  << printable(context.root().path("/var/lib/tavrel/registry")) << '\n';
+                  << printable(context.root().path(kRecordingFolder)) << '\n';
     return;
   }
   table.print(context.out(), context.columns());

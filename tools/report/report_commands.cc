@@ -12,6 +12,7 @@
 
 #include "base/format.h"
 #include "ioreport/ioreport.h"
+#include "platform/linux/recorded/recording_folder.h"
 #include "tools/report/report_delta.h"
 #include "tools/report/report_json.h"
 #include "tools/report/report_selection.h"
@@ -23,9 +24,6 @@ namespace tavrel {
 namespace {
 
 constexpr double kLongestInterval = 86'400;  // seconds
-
-constexpr std::string_view kNoHub =
-    "there is no hub: a recording in /var/lib/tavrel/registry must have a \"Hub\"";
 
 struct Arguments {
   ReportSelection selection;
@@ -67,8 +65,11 @@ class Sampler {
                                                &subscribed_, 0, &error);
     if (subscription_) return;
     const bool isHubMissing = error && error->code == kKernelNotFound && !reasonOf(error);
-    context.fail(
-        reportFailure("subscribe to the channels", error, isHubMissing ? kNoHub : kLookAtDrivers));
+    std::string advice(kLookAtDrivers);
+    if (isHubMissing) {
+      advice = format("there is no hub: a recording in %s must have a \"Hub\"", kRecordingFolder);
+    }
+    context.fail(reportFailure("subscribe to the channels", error, advice));
   }
 
   explicit operator bool() const { return subscription_ != nullptr; }

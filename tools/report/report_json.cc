@@ -5,7 +5,6 @@
 
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
-#include "ioreport/state_values.h"
 #include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
 

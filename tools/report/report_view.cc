@@ -10,7 +10,6 @@
 #include "base/format.h"
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
-#include "ioreport/state_values.h"
 #include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
 #include "tools/shared/quantity_text.h"
@@ -64,7 +63,10 @@ class Place {
     }
   }
   /// How many levels the channel lies below.
-  std::size_t depth() const { return names_[1].empty() ? 1 : names_[2].empty() ? 2 : 3; }
+  std::size_t depth() const {
+    if (names_[1].empty()) return 1;
+    return names_[2].empty() ? 2 : 3;
+  }
 
  private:
   std::string names_[3];

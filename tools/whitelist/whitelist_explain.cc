@@ -24,25 +24,19 @@ using Rule = WhitelistDecision::Rule;
 constexpr std::string_view kLabels[] = {"  scalar        ", "  distribution  "};
 constexpr std::string_view kContinuation = "                ";
 
-/// Why the daemon does not load a group; nothing for a loaded one.
-std::optional<std::string_view> reasonNotLoaded(Platform& platform, std::string_view group) {
-  if (BHIsInternalDevice(platform)) return std::nullopt;
-  if (group == kInternalTestingGroup) return "it is for internal devices";
-  bool exists = false;
-  const bool enabled =
-      platform.preferences->ZTXPreferencesGetBoolValue(group, kTaskingSwitchDomain, &exists);
-  if (exists && !enabled) return "it is switched off by tasking";
-  return std::nullopt;
+std::string_view textOf(BHConfig::Exclusion exclusion) {
+  return exclusion == BHConfig::Exclusion::InternalOnly ? "it is for internal devices"
+                                                        : "it is switched off by tasking";
 }
 
 KindExplanation explainKind(const WhitelistDecision& decision, const WhitelistDecision& ifAllLoaded,
-                            const plist::Dictionary& options, Platform& platform) {
+                            const plist::Dictionary& options, const BHConfig& config) {
   KindExplanation explanation{
       decision.rule, std::string(decision.group), std::string(decision.prefix), options, {}, {}};
   if (ifAllLoaded.group != decision.group) {
-    if (const auto reason = reasonNotLoaded(platform, ifAllLoaded.group)) {
+    if (const auto exclusion = config.exclusionOf(ifAllLoaded.group)) {
       explanation.idleGroup = ifAllLoaded.group;
-      explanation.idleReason = *reason;
+      explanation.idleReason = textOf(*exclusion);
     }
   }
   return explanation;
@@ -152,7 +146,7 @@ Expected<std::vector<KeyExplanation>> explainKeys(LinuxPlatform& device, const s
   const WhitelistModel model(whitelist);
   const bool isInternal = BHIsInternalDevice(platform);
   const WhitelistDecisions loaded(
-      model, isInternal, [&](std::string_view group) { return !reasonNotLoaded(platform, group); });
+      model, isInternal, [&](std::string_view group) { return !config->exclusionOf(group); });
   const WhitelistDecisions all(model, isInternal, [](std::string_view) { return true; });
 
   std::vector<KeyExplanation> explanations;
@@ -160,7 +154,7 @@ Expected<std::vector<KeyExplanation>> explainKeys(LinuxPlatform& device, const s
     const auto explain = [&](WhitelistTable exact, WhitelistTable prefixes,
                              const plist::Dictionary& options) {
       return explainKind(loaded.decide(exact, prefixes, key), all.decide(exact, prefixes, key),
-                         options, platform);
+                         options, *config);
     };
     KeyExplanation explanation;
     explanation.key = key;

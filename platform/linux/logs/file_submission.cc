@@ -5,16 +5,13 @@
 
 #include "base/limits.h"
 #include "platform/linux/logs/log_file_name.h"
+#include "platform/persisted_state.h"
 
 namespace tavrel {
 namespace {
 
 constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission";
 constexpr std::string_view kLogEnding = ".log";
-constexpr std::string_view kMetadataEnding = ".metadata.plist";
-constexpr std::string_view kServiceDomain = "com.norvane.zentrix";
-constexpr std::string_view kTaskingDomain = "com.norvane.da";
-constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
 
 // Statistics are readable by their owner and a group of operators only.
 constexpr mode_t kMode = 0640;
@@ -59,11 +56,11 @@ FileSubmission::FileSubmission(const DeviceRoot& root, FileSystem& files,
       log_(log) {}
 
 bool FileSubmission::isDiagnosticSubmissionEnabled() {
-  return preferences_.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kServiceDomain);
+  return preferences_.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
 }
 
 bool FileSubmission::hasInternalDiagnostics(std::string_view identifier) {
-  return preferences_.ZTXPreferencesGetBoolValue(identifier, kServiceDomain);
+  return preferences_.ZTXPreferencesGetBoolValue(identifier, kDiagnosticsDomain);
 }
 
 std::string FileSubmission::ZTXOSVersion() {
@@ -98,7 +95,7 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
 
   const std::string name = newLogFileName(logName, now);
   const std::string logPath = join(folder(Place::Pending), name, kLogEnding);
-  const std::string metadataPath = join(folder(Place::Pending), name, kMetadataEnding);
+  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
 
   Expected<NewFile> file = files_.create(logPath, kMode);
   if (!file) return file.error();
@@ -127,7 +124,7 @@ void FileSubmission::removeOldMetadata(const std::string& freshMetadata) {
   const auto names = files_.list(folder(Place::Pending));
   if (!fresh || !names) return;
   for (const std::string& file : *names) {
-    const std::string name = withoutEnding(file, kMetadataEnding);
+    const std::string name = withoutEnding(file, kLogMetadataEnding);
     if (name.empty() || FileSystem::status(join(folder(Place::Pending), name, kLogEnding)))
       continue;
     const std::string path = join(folder(Place::Pending), file, {});
@@ -149,7 +146,7 @@ void FileSubmission::submitDiagnosticLogs() {
     if (name.empty()) {
       // Metadata follows its log, which precedes it in the list or moved before a process was
       // killed.
-      name = withoutEnding(file, kMetadataEnding);
+      name = withoutEnding(file, kLogMetadataEnding);
       if (!name.empty() && !FileSystem::status(join(folder(Place::Pending), name, kLogEnding)) &&
           FileSystem::status(join(folder(Place::Outbox), name, kLogEnding))) {
         files_.discard(join(folder(Place::Pending), file, {}));
@@ -164,11 +161,11 @@ void FileSubmission::submitDiagnosticLogs() {
 
 Status FileSubmission::moveToOutbox(const std::string& name) {
   const std::string outbox = folder(Place::Outbox);
-  const std::string metadataPath = join(folder(Place::Pending), name, kMetadataEnding);
+  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
   const auto metadata = files_.readIfPresent(metadataPath, limits::kPropertyListBytes);
   if (!metadata) return metadata.error();
   const Status ready =
-      *metadata ? files_.replace(join(outbox, name, kMetadataEnding), asBytes(**metadata), kMode)
+      *metadata ? files_.replace(join(outbox, name, kLogMetadataEnding), asBytes(**metadata), kMode)
                 : files_.makeFolders(outbox);
   if (!ready) return ready;
   return files_.rename(join(folder(Place::Pending), name, kLogEnding),
@@ -188,7 +185,7 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::files(Place plac
 }
 
 void FileSubmission::readMetadata(FiledLog& log) {
-  const auto bytes = files_.readIfPresent(join(folder(log.place), log.name, kMetadataEnding),
+  const auto bytes = files_.readIfPresent(join(folder(log.place), log.name, kLogMetadataEnding),
                                           limits::kPropertyListBytes);
   if (!bytes || !*bytes) return;
   if (const auto value = propertyLists_.decode(asBytes(**bytes))) {

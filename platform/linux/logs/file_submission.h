@@ -25,6 +25,9 @@
 
 namespace tavrel {
 
+/// The end of the name of a log's metadata, which begins as the log's.
+inline constexpr std::string_view kLogMetadataEnding = ".metadata.plist";
+
 /// Entries of a log's metadata.
 inline constexpr std::string_view kLogMetadataType = "LogType";       // string
 inline constexpr std::string_view kLogMetadataName = "LogName";       // string

@@ -50,13 +50,11 @@ const char* HubChannels::addOne(const plist::Dictionary& channel) {
   plist::Value elements = channel.get("Elements");
   if (const plist::Array groups = elements.array()) elements = plist::mutableCopy(groups);
   const plist::Array groups = elements.array();
-  const bool isWhole =
-      groups ? !groups.empty() &&
-                   std::all_of(groups.begin(), groups.end(),
-                               [&](const plist::Value& group) {
-                                 return isGroupOf(group.data().bytes(), *driverID, *channelID);
-                               })
-             : isGroupOf(elements.data().bytes(), *driverID, *channelID);
+  const auto isGroup = [&](const plist::Value& group) {
+    return isGroupOf(group.data().bytes(), *driverID, *channelID);
+  };
+  bool isWhole = isGroup(elements);
+  if (groups) isWhole = !groups.empty() && std::all_of(groups.begin(), groups.end(), isGroup);
   if (!isWhole) {
     return "its \"Elements\" are no groups of it; give elements of 64 bytes with its ids, the "
            "first with their number at offset 20";

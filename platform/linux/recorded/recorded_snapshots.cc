@@ -36,8 +36,7 @@ class RecordedSnapshot final : public StackSnapshot {
 }  // namespace
 
 std::unique_ptr<StackSnapshot> RecordedSnapshots::create() {
-  return std::make_unique<RecordedSnapshot>(
-      files_, log_, root_.path("/var/lib/tavrel/registry/stack-snapshot.bin"));
+  return std::make_unique<RecordedSnapshot>(files_, log_, root_.path(kRecordedSnapshot));
 }
 
 }  // namespace tavrel

@@ -3,12 +3,16 @@
 // the file and, with a line in the system log, when the file cannot be read.
 #pragma once
 
+#include <string_view>
+
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/stack_snapshot.h"
 #include "platform/system_log.h"
 
 namespace tavrel {
+
+inline constexpr std::string_view kRecordedSnapshot = "/var/lib/tavrel/registry/stack-snapshot.bin";
 
 class RecordedSnapshots final : public StackSnapshots {
  public:

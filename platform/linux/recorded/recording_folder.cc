@@ -7,13 +7,12 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kFolder = "/var/lib/tavrel/registry";
 constexpr std::string_view kEnding = ".plist";
 
 }  // namespace
 
 std::vector<RecordingFolder::Stamp> RecordingFolder::stampFiles() {
-  const std::string folder = root_.path(kFolder);
+  const std::string folder = root_.path(kRecordingFolder);
   const auto names = files_.list(folder);
   const std::string complaint = names ? std::string() : names.error().message;
   if (complaint != complaint_) {

@@ -4,6 +4,7 @@
 #include <cstdint>
 #include <ctime>
 #include <string>
+#include <string_view>
 #include <sys/types.h>
 #include <vector>
 
@@ -14,6 +15,8 @@
 #include "platform/system_log.h"
 
 namespace tavrel {
+
+inline constexpr std::string_view kRecordingFolder = "/var/lib/tavrel/registry";
 
 class RecordingFolder {
  public:

@@ -11,6 +11,7 @@
 #include "base/civil_time.h"
 #include "platform/guarded.h"
 #include "platform/linux/store/sqlite_schema.h"
+#include "platform/store_path.h"
 
 namespace tavrel {
 

@@ -33,9 +33,6 @@
 
 namespace tavrel {
 
-/// The store's file on the device.
-inline constexpr std::string_view kStorePath = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
-
 class SqliteStore : public StatisticsStore {
  public:
   /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited

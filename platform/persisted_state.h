@@ -1,4 +1,5 @@
-// Names of the daemon's state in the preferences, for all code that reads or writes it.
+// Names of what stands in the preferences, for everybody who reads or writes it: the daemon's
+// state, and what others decide for it.
 #pragma once
 
 #include <string_view>
@@ -26,6 +27,14 @@ inline constexpr std::string_view kTaskingIDKey = "TaskingID";
 inline constexpr std::string_view kTaskingOSKey = "TaskingOS";
 inline constexpr std::string_view kTaskingDigestKey = "TaskingDigest";
 inline constexpr std::string_view kTaskingPayloadKey = "TaskingPayload";
+
+/// Boolean: whether logs may leave the device. In the same domain are booleans named after an
+/// identifier, which turn its internal diagnostics on.
+inline constexpr std::string_view kDiagnosticsDomain = "com.norvane.zentrix";
+inline constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
+
+/// Values that a tasking has set, among them booleans that switch whitelist groups off by name.
+inline constexpr std::string_view kTaskingDomain = "com.norvane.da";
 
 /// Where another component schedules a tasking.
 inline constexpr std::string_view kScheduleDomain = "com.norvane.Drovelink";
