@@ -65,11 +65,7 @@ DeviceStatus takeStatus(ToolContext& context) {
       status.days = history.error();
     }
   }
-  if (const auto files = device.submission().files(FileSubmission::Place::Pending)) {
-    status.pending = files->size();
-  } else {
-    status.pending = files.error();
-  }
+  status.pending = device.submission().count(FileSubmission::Place::Pending);
   if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
 }

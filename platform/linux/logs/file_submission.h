@@ -63,6 +63,8 @@ class FileSubmission final : public SubmissionService {
   /// opened and `metadata` is empty.
   Expected<std::vector<FiledLog>> files(Place place);
   void readMetadata(FiledLog& log);
+  /// How many there are.
+  Expected<std::size_t> count(Place place) const;
 
   /// The logs of one place with their metadata, oldest first. Opens the metadata of each.
   Expected<std::vector<FiledLog>> logs(Place place);
