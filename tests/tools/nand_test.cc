@@ -143,7 +143,8 @@ TEST(NandParse, ReadsBackWhatWasBuilt) {
                           21,  3, 5,      0, 5, 0, 5, 0, 184, 0}));
   EXPECT_EQ(
       device.run({"nand", "parse", "-"}, first),
-      (Outcome{0, R"(STATISTIC                       VALUE
+      (Outcome{
+          0, R"(STATISTIC                       VALUE
 exportVersion              4295098371
 hostWrites                          1
 hostWrites       18446744073709551615
@@ -152,8 +153,8 @@ readCountHisto1                     2
 readCountHisto2                     3
 ECBins                              9
 )",
-               "tavrelctl: standard input: 2 records not listed: of unknown statistics, without "
-               "values or with too many: --json prints them whole\n"}));
+          "tavrelctl: standard input: 2 records not wholly listed: of unknown statistics, without "
+          "values or with too many: --json prints them whole\n"}));
   const Outcome parsed = device.run({"nand", "parse", "-", "--json"}, first + "\xab");
   EXPECT_EQ(device.run({"nand", "build", "-", "-o", "-"}, parsed.out), prints(first + "\xab"));
   EXPECT_EQ(jsonOf(parsed).dump(),
@@ -188,10 +189,10 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
         second + "0x30000001 is above 0x30000000, the largest number of a statistic");
   parse(good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])", 1,
         second + "statistic 54 has 4294967295 values, but there is room for 1");
-  EXPECT_EQ(
-      device.run({"nand", "parse", "-"}, built(device, good + "[805306368, []]]")).error,
-      "tavrelctl: standard input: 1 record not listed: of unknown statistics, without values or "
-      "with too many: --json prints them whole\n");
+  EXPECT_EQ(device.run({"nand", "parse", "-"}, built(device, good + "[805306368, []]]")).error,
+            "tavrelctl: standard input: 1 record not wholly listed: of unknown statistics, without "
+            "values or "
+            "with too many: --json prints them whole\n");
   EXPECT_EQ(device.run({"nand", "parse", "-"}, words({4, 1, 1, 0, 0})),
             (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
                      "tavrelctl: standard input: the last 4 bytes are no whole unit of 8 and were "

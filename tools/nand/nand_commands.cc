@@ -104,7 +104,7 @@ void parse(ToolContext& context, const Arguments& arguments) {
   if (context.json()) return printStatisticsJson(context.out(), result, statistics, buffer);
   if (const auto unlisted = printStatistics(context.page(), statistics, buffer); unlisted > 0) {
     context.note(
-        format("%s: %s not listed: of unknown statistics, without values or with too many: "
+        format("%s: %s not wholly listed: of unknown statistics, without values or with too many: "
                "--json prints them whole",
                nameOf(arguments.file), counted(unlisted, "record")));
   }

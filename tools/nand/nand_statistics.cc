@@ -56,12 +56,12 @@ std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
 // As `nand build` reads them. What is not listed is a record of its own, so that nothing is lost.
 void addEntries(JsonList& entries, const Record& record) {
   if (!record.isListed()) {
-    Json values = Json::array();
+    // A record may fill the whole buffer; as text it needs no more than its digits.
+    const Json key = record.statistic ? Json(record.statistic->name) : Json(record.key);
+    std::string text = format("{\"key\": %s, \"values\": [", key.dump());
     for (std::size_t i = 0; i < record.count(); ++i)
-      values.push_back(record.value(i));
-    entries.add({{"key", record.statistic ? Json(record.statistic->name) : Json(record.key)},
-                 {"values", std::move(values)}});
-    return;
+      appendFormat(text, "%s%llu", i > 0 ? ", " : "", record.value(i));
+    return entries.addText(text + "]}");
   }
   const std::string name(record.statistic->name);
   if (record.count() == 1) return entries.add(Json::array({name, record.value(0)}));
