@@ -183,29 +183,33 @@ class SamplePrinter {
     std::int64_t upper = 0;
     hasBounds = hasBounds &&
                 IOReportHistogramGetBucketBounds(channel, bucket, &lower, &upper) == kKernelSuccess;
-    return hasBounds ? format("(%llu, %llu]", lower, upper) : format("bucket %d", bucket);
+    if (!hasBounds) return "bucket " + std::to_string(bucket);
+    return '(' + std::to_string(static_cast<std::uint64_t>(lower)) + ", " +
+           std::to_string(static_cast<std::uint64_t>(upper)) + ']';
   }
 
   void printHistogram(const plist::Dictionary& channel) {
     const std::int32_t count = IOReportHistogramGetBucketCount(channel);
+    const Elements buckets = elementsOfType(channel, kFormatHistogram);
     std::uint64_t largest = 0;
     std::vector<std::int64_t> hits;
     for (std::int32_t i = 0; i < count; ++i) {
-      hits.push_back(IOReportHistogramGetBucketHits(channel, i));
+      hits.push_back(buckets.value(static_cast<std::size_t>(i), kBucketHits));
       if (hits.back() == kInvalidValue) break;
       if (hits.back() > 0) largest = std::max(largest, static_cast<std::uint64_t>(hits.back()));
     }
     Rows rows;
     bool hasBounds = true;
     for (std::int32_t i = 0; i < count && hits.back() != kInvalidValue; ++i) {
-      const std::int64_t hitsOf = hits[static_cast<std::size_t>(i)];
-      const std::int64_t sum = IOReportHistogramGetBucketSum(channel, i);
+      const auto bucket = static_cast<std::size_t>(i);
+      const std::int64_t hitsOf = hits[bucket];
+      const std::int64_t sum = buckets.value(bucket, kBucketSum);
       std::string spread;
       if (hitsOf > 0 && sum != kInvalidValue) {
         spread =
             format("mean %.1f, %s to %s", static_cast<double>(sum) / static_cast<double>(hitsOf),
-                   signedText(IOReportHistogramGetBucketMinValue(channel, i)),
-                   signedText(IOReportHistogramGetBucketMaxValue(channel, i)));
+                   signedText(buckets.value(bucket, kBucketMinimum)),
+                   signedText(buckets.value(bucket, kBucketMaximum)));
       }
       rows.push_back({boundsText(channel, i, hasBounds), countText(hitsOf, isDelta_),
                       Table::Cell::bar(static_cast<double>(hitsOf), static_cast<double>(largest)),
@@ -216,13 +220,13 @@ class SamplePrinter {
   }
 
   void printArray(const plist::Dictionary& channel) {
-    const Elements elements = getRawElements(channel, kFormatSimpleArray);
-    const auto count = static_cast<std::int32_t>(kElementValues * elements.count());
-    constexpr auto kColumns = static_cast<std::int32_t>(kElementValues);
+    const Elements elements = elementsOfType(channel, kFormatSimpleArray);
+    const std::size_t count = getRawElements(channel, kFormatSimpleArray).count();
     Rows rows;
-    for (std::int32_t i = 0; i < count; ++i) {
-      if (i % kColumns == 0) rows.push_back({format("[%d]", i)});
-      rows.back().emplace_back(signedText(IOReportArrayGetValueAtIndex(channel, i)));
+    for (std::size_t element = 0; element < count; ++element) {
+      rows.push_back({'[' + std::to_string(kElementValues * element) + ']'});
+      for (std::size_t i = 0; i < kElementValues; ++i)
+        rows.back().emplace_back(signedText(elements.value(element, i)));
     }
     constexpr auto kRight = Table::Align::Right;
     printBlock(channel, {{"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}, {"", kRight}},
