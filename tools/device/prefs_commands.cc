@@ -138,7 +138,7 @@ void list(ToolContext& context, const Arguments& arguments) {
                inlineText(entry->value)});
   }
   if (!table.empty()) {
-    table.print(context.out(), context.columns());
+    table.print(context.page());
   } else if (!context.hasComplaints()) {
     context.out() << format("no preferences in domain %s\n", arguments.domain);
   }

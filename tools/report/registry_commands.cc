@@ -99,7 +99,7 @@ void list(ToolContext& context, const Arguments&) {
                   << printable(context.root().path(kRecordingFolder)) << '\n';
     return;
   }
-  table.print(context.out(), context.columns());
+  table.print(context.page());
 }
 
 void show(ToolContext& context, const Arguments& arguments) {

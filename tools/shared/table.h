@@ -56,9 +56,6 @@ class Table {
   /// elsewhere cells are whole, and long ones push the rest of their row aside. Bars take the
   /// columns that are left. Titles that are all empty are not printed.
   void print(const Page& page) const;
-  void print(std::ostream& out, std::optional<std::size_t> columns) const {
-    print(Page{out, columns});
-  }
 
  private:
   std::vector<std::size_t> widths(const Page& page) const;

@@ -152,7 +152,7 @@ void printScalar(ToolContext& context, const Statistic& statistic) {
   Table table({{"DAY"}, {"VALUE", kRight}}, 2);
   for (const ScalarDay& day : statistic.scalarDays)
     table.add({dayText(day.day), std::to_string(day.value)});
-  table.print(context.out(), context.columns());
+  table.print(context.page());
 }
 
 std::vector<std::string> cellsOf(const Summary& summary) {
@@ -164,7 +164,7 @@ std::vector<std::string> cellsOf(const Summary& summary) {
 
 void printDistribution(ToolContext& context, const Statistic& statistic) {
   std::ostream& out = context.out();
-  const auto columns = context.columns();
+  const Page page = context.page();
   const Summary& summary = statistic.summary;
   out << "Distribution " << printable(statistic.key) << ", "
       << counted(statistic.distributionDays.size(), "day") << "\n\n";
@@ -181,20 +181,21 @@ void printDistribution(ToolContext& context, const Statistic& statistic) {
     facts.add({"Mean", cells[3]});
     facts.add({"Standard deviation", shortNumber(summary.standardDeviation())});
   }
-  facts.print(out, columns);
+  facts.print(page);
   if (!statistic.buckets.empty()) {
     out << "\nHistogram\n";
-    printBuckets(out, statistic.buckets, columns);
+    printBuckets(page, statistic.buckets);
   }
   out << '\n';
   Table table(
       {{"DAY"}, {"COUNT", kRight}, {"MINIMUM", kRight}, {"MAXIMUM", kRight}, {"MEAN", kRight}}, 2);
   for (const DistributionDay& day : statistic.distributionDays) {
-    std::vector<std::string> row = cellsOf(day.summary);
-    row.insert(row.begin(), dayText(day.day));
+    std::vector<Table::Cell> row{dayText(day.day)};
+    for (std::string& cell : cellsOf(day.summary))
+      row.emplace_back(std::move(cell));
     table.add(std::move(row));
   }
-  table.print(out, columns);
+  table.print(page);
 }
 
 }  // namespace
