@@ -178,7 +178,7 @@ TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
       },
       errors);
   EXPECT_EQ(waitFor(daemon), 0);
-  const std::string line = Device::contentOf(errors);
+  const std::string line = contentOf(errors);
   EXPECT_EQ(line.substr(line.find(' ')), " error cannot use device root " + none +
                                              "/: No such file or directory: name the device's "
                                              "folder with TAVREL_ROOT\n");

@@ -198,6 +198,8 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       {"whitelist", "check"},
       {"whitelist", "explain", "app.starts", "app.load", "--value", "123"},
       {"stat", "list"},
+      {"stat", "show", "app.starts"},
+      {"stat", "show", "app.load"},
       {"tasking", "show"},
       {"nand", "info"},
       {"nand", "info", "--all"},

@@ -94,7 +94,7 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
   table.add({"a long key indeed", "100"});
   const auto print = [&](std::optional<std::size_t> columns) {
     std::ostringstream out;
-    table.print(out, columns);
+    table.print({out, columns});
     return out.str();
   };
   EXPECT_EQ(print(std::nullopt),

@@ -105,7 +105,7 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
     table.add({text(dictionary.get("Domain")), text(dictionary.get("Key")),
                inlineText(dictionary.get("Value"))});
   }
-  if (!table.empty()) table.print(out, context.columns());
+  if (!table.empty()) table.print(context.page());
 }
 
 void show(ToolContext& context) {

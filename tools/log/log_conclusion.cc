@@ -18,6 +18,7 @@ std::string LogConclusion::text() const {
 Json LogConclusion::json() const {
   return {{"run", run()},
           {"day", day ? Json(*day) : Json(nullptr)},
+          {"date", day ? Json(dayDateText(*day)) : Json(nullptr)},
           {"outcome", outcome ? Json(nameOf(*outcome)) : Json(nullptr)}};
 }
 
