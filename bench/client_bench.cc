@@ -1,5 +1,5 @@
-// Recording through libbrimhold beside the least that it could do, in one program: an atomic add on
-// a shared page, a look at the coarse clock and a comparison of days; for records also 16 bytes
+// Recording through libbrimhold next to the least that it could do, in one program: an atomic add
+// on a shared page, a look at the coarse clock and a comparison of days; for records also 16 bytes
 // stored. Both include what a page of memory costs, and leave out folding.
 #include <atomic>
 #include <benchmark/benchmark.h>
@@ -39,7 +39,7 @@ class Device {
   }
   ~Device() { std::filesystem::remove_all(root_); }
 
-  /// Aborts when values were dropped: then the figures would be of something else.
+  /// Aborts when values were dropped, because the figures would then measure something else.
   void fold() {
     const std::scoped_lock lock(mutex_);
     for (const auto& entry : std::filesystem::directory_iterator(root_ / "run/tavrel/stat")) {

@@ -1,5 +1,5 @@
-"""Counts what reaches a block device: its file system's own blocks and journal included, which the
-account that the kernel keeps of a process leaves out."""
+"""Counts what reaches a block device, including the file system's own blocks and journal, which the
+kernel's account of a process leaves out."""
 
 import os
 import shutil
@@ -15,8 +15,8 @@ def call(*command):
 
 
 class BlockDevice:
-    """An ext4 file system on a loop device, mounted while it is entered. Entering yields nothing,
-    and `reason` says why, where the system does not allow it."""
+    """An ext4 file system on a loop device, mounted while it is entered. Where the system does not
+    allow that, entering yields nothing, and `reason` says why."""
 
     def __enter__(self):
         self.folder = tempfile.mkdtemp(prefix="tavrel_flash.")
@@ -26,7 +26,7 @@ class BlockDevice:
             image = os.path.join(self.folder, "image")
             with open(image, "wb") as file:
                 file.truncate(IMAGE_BYTES)
-            # All is written now, so that nothing of it is written while a run is measured.
+            # Writes everything now, so that none of it is written while a run is measured.
             call("mkfs.ext4", "-q", "-F", "-E", "lazy_itable_init=0,lazy_journal_init=0", image)
             self.loop = call("losetup", "--find", "--show", image)
             os.mkdir(self.mounted)
@@ -45,7 +45,7 @@ class BlockDevice:
         shutil.rmtree(self.folder)
 
     def written(self):
-        """Bytes since the device exists, with all that waits to be written."""
+        """Bytes written since the device exists, after writing all that waits."""
         descriptor = os.open(self.mounted, os.O_RDONLY)
         try:
             os.fsync(descriptor)

@@ -1,4 +1,4 @@
-"""The figures that are wanted, all of them, and the account of those that were missed.
+"""The limits of the measured figures, and a list of the figures that missed theirs.
 
     wanted = Wanted()
     print(f"  memory  {mebibytes:.2f} MiB{wanted.judge('service: memory when idle, MiB', mebibytes)}")
@@ -23,7 +23,7 @@ class Wanted:
         self.missed = []
 
     def judge(self, name, figure):
-        """What is to be printed behind a figure."""
+        """The text to print after a figure."""
         limit = LIMITS[name]
         if figure <= limit:
             return f"   wanted <= {limit:g}"
@@ -31,7 +31,7 @@ class Wanted:
         return f"   MISSED, wanted <= {limit:g}"
 
     def status(self):
-        """Lists what was missed; the exit status of the program."""
+        """Prints the missed figures, and yields the exit status of the program."""
         for line in self.missed:
             print(f"missed: {line}")
         return 1 if self.missed else 0

@@ -10,15 +10,15 @@ static bool isClosed(uint32_t closes) {
   return closes % 2 != 0;
 }
 
-/* Closes a cell that is left. Always to another number, so that an acknowledgement of an earlier
- * close does not count for what was added since. */
+/* Closes a cell that is no longer used. The number differs each time, so that an acknowledgement of
+ * an earlier close does not count for what was added since. */
 static void closeCell(struct Cell* cell) {
   uint32_t closes = atomic_load(&cell->closes);
   while (!atomic_compare_exchange_weak(&cell->closes, &closes, (closes + 1) | 1)) {
   }
 }
 
-/* False when the cell was given to another time meanwhile. */
+/* False when the cell was given to another time in the meantime. */
 static bool reopen(struct Cell* cell, uint64_t start) {
   uint32_t closes = atomic_load(&cell->closes);
   while (isClosed(closes)) {
@@ -36,7 +36,7 @@ static bool reuse(struct Key* key, struct Cell* cell, uint64_t start) {
   return true;
 }
 
-/* A cell of the key for `start`, or one that it needs no longer. */
+/* A cell of the key for `start`, or one that the key no longer needs. */
 static struct Cell* findKnown(struct State* state, struct Segment* segment, struct Key* key,
                               uint32_t newest, uint64_t start) {
   for (uint32_t number = newest; number != 0; number = atomic_load(&state->older[number - 1])) {

@@ -1,4 +1,4 @@
-/* What the library's files offer each other. */
+/* The interfaces between the library's own files. */
 #ifndef BRIMHOLD_INTERNAL_H
 #define BRIMHOLD_INTERNAL_H
 
@@ -13,22 +13,22 @@
 
 /* process.c */
 
-/* The library's memory; NULL before the first look-up and where the kernel lacks what it takes. */
+/* The library's memory; NULL before the first look-up, and when the kernel lacks a feature. */
 struct Process* bhProcess(void);
-/* The same, made when missing. */
+/* The same, but creates missing memory. */
 struct Process* bhMakeProcess(void);
 
 /* keys.c */
 
-/* Names the key in the segment. Returns its number; 0 when there is no memory for it. */
+/* Names the key in the segment. Returns its number, or 0 without memory for it. */
 uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key* key);
 bool bhWasKeyRefused(void);
-/* A place in the table of keys; not of handles that were refused. */
+/* A place in the table of keys; refused handles have none. */
 bool bhIsKey(const struct Process* process, const struct Key* key);
 
 /* segment.c */
 
-/* The process's segment, begun when it has none; NULL when that fails, see `State.status`. */
+/* The process's segment; begins one when there is none. NULL on failure, see `State.status`. */
 struct Segment* bhSegment(struct Process* process);
 /* Fetches memory, so that a full tmpfs shows here and not as SIGBUS. */
 bool bhFetch(const void* from, size_t bytes);
@@ -40,13 +40,13 @@ void bhDrop(struct Segment* segment);
 /* Makes, maps and describes a new segment; NULL with `status` when that fails. */
 struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status);
 void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment);
-/* Puts empty memory of the process in the place of a mapping that it inherited. */
+/* Replaces a mapping that the process inherited by empty memory of its own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);
 
 /* facts.c */
 
-/* Who the process is, for readers; what cannot be found out stays 0. */
+/* Identifies the process for readers; fields that cannot be found out stay 0. */
 void bhDescribeProcess(struct Segment* segment);
 
 /* cells.c */
@@ -56,9 +56,9 @@ struct Cell* bhFindCell(struct Key* key);
 
 /* chunks.c */
 
-/* Looks what the last fold has freed. */
+/* Finds out which chunks the last fold has freed. */
 void bhNoticeFold(struct Process* process, struct Segment* segment);
-/* Records where the fast path could not. */
+/* Records when the fast path cannot. */
 void bhRecordSlowly(struct Key* key, double value);
 
 /* Times. */

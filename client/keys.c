@@ -37,7 +37,7 @@ static uint32_t hashOf(const char* name, uint32_t length, uint32_t kind) {
   return hash;
 }
 
-/* Takes `amount` of `limit`; answers where it begins, or `limit` when it does not fit. */
+/* Takes `amount` of `limit`; returns where it begins, or `limit` when it does not fit. */
 static uint32_t take(_Atomic uint32_t* used, uint32_t amount, uint32_t limit) {
   uint32_t start = atomic_load(used);
   do {
@@ -62,7 +62,7 @@ static struct Key* refuse(void) {
   return &refusedKey;
 }
 
-/* 0 for what is no name. */
+/* 0 for an invalid name. */
 static size_t lengthOfName(const char* name) {
   const size_t length = name ? strnlen(name, kBHLongestName + 1) : 0;
   if (length > kBHLongestName) return 0;

@@ -88,16 +88,16 @@ struct Lane {
 };
 
 /* Memory that the kernel empties in a child (MADV_WIPEONFORK): a child begins without a segment,
- * and no call has to look whether it is in one. */
+ * and no call has to check whether it runs in one. */
 struct State {
   _Atomic(struct Segment*) segment;
-  _Atomic uint64_t retryAt; /* CLOCK_MONOTONIC seconds before which no segment is begun */
+  _Atomic uint64_t retryAt; /* no segment is begun before these CLOCK_MONOTONIC seconds */
   _Atomic int status;       /* why there is none */
   _Atomic uint32_t nextLane;
   _Atomic(struct Chunk*) spareChunk; /* opened, but another thread was faster */
   _Atomic uint32_t fetchedChunks;    /* chunks whose memory is there */
   _Atomic uint64_t knownFolds;       /* the segment's folds when reusable chunks were counted */
-  _Atomic int32_t reusableChunks;    /* those that a fold has acknowledged, about */
+  _Atomic int32_t reusableChunks;    /* about how many a fold has acknowledged */
   _Atomic uint32_t nextReusable;     /* where to look for one */
   _Atomic int isFull;
   _Atomic int askedForFold;
@@ -106,10 +106,10 @@ struct State {
   _Atomic uint16_t older[kBHCellCount]; /* number of the same key's next older cell; 0 is none */
 };
 
-/* Memory that children share the content of. */
+/* Memory whose content children share. */
 struct Process {
   struct State* state;
-  _Atomic(struct Segment*) mapped; /* the segment of this process, else that of its parent */
+  _Atomic(struct Segment*) mapped; /* the segment of this process, or of its parent */
   char folder[kLongestFolder];
 };
 

@@ -1,5 +1,5 @@
-/* Every bound of the library, with its unit and its reason. The sizes of a segment's parts stand
- * in segment_format.h. */
+/* Every bound of the library, with its unit and its reason. segment_format.h has the sizes of a
+ * segment's parts. */
 #ifndef BRIMHOLD_LIMITS_H
 #define BRIMHOLD_LIMITS_H
 

@@ -17,7 +17,7 @@ static void* mapMemory(size_t bytes) {
 
 static bool findFolder(char folder[kLongestFolder]) {
   static const char kFolder[] = "/run/tavrel/stat";
-  /* A program that runs with more rights than its caller does not take paths from him. */
+  /* A program that runs with more rights than its caller does not take paths from the caller. */
   const char* root = secure_getenv("TAVREL_ROOT");
   size_t length = root ? strlen(root) : 0;
   while (length > 0 && root[length - 1] == '/')

@@ -22,7 +22,7 @@ void BHClientScalarAdd(BHClientScalarKey* handle, int64_t amount) {
   struct Cell* cell = cellOfToday(key);
   if (!cell) cell = cellFor(key);
   if (!cell) return;
-  /* A set between the two lines supersedes the add; after a second one the add comes last. */
+  /* A set between the two lines replaces the add; after a second set the add comes last. */
   const uint64_t sets = atomic_load_explicit(&cell->sets, memory_order_acquire);
   atomic_fetch_add_explicit(&cell->slots[sets % 2], amount, memory_order_relaxed);
 }

@@ -1,4 +1,4 @@
-/* The stores that make a record. */
+/* The memory writes that make up a record. */
 #ifndef BRIMHOLD_RECORD_H
 #define BRIMHOLD_RECORD_H
 

@@ -27,7 +27,7 @@ struct Segment* bhSegment(struct Process* process) {
     atomic_store_explicit(&state->retryAt, now + kRetrySeconds, memory_order_relaxed);
     return atomic_load_explicit(&state->segment, memory_order_acquire);
   }
-  /* Nobody waits for another thread here, or for the code that a signal handler interrupted: each
+  /* No thread waits here for another, or for the code that a signal handler interrupted: each
    * begins a segment, and one of them stays. */
   if (atomic_compare_exchange_strong_explicit(&state->segment, &known, begun, memory_order_acq_rel,
                                               memory_order_acquire)) {

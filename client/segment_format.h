@@ -27,10 +27,10 @@
  * of each cell. With the same number of sets the difference of the values is an add. With another,
  * the value is a set.
  *   A cell never goes back to zero. Once its day is over the process makes kBHCellCloses odd; a
- * reader that saw it odd *before* it read the value, and has folded that value for good, writes
- * what it saw to kBHCellAcknowledged. Only then may the process give the cell another kBHCellStart
- * for the same key; differences from then on belong to that time. Thus a thread that stopped
- * between its look at the clock and its add loses nothing.
+ * reader that saw it odd *before* it read the value, and has folded that value durably, writes
+ * the number that it saw to kBHCellAcknowledged. Only then may the process give the cell another
+ * kBHCellStart for the same key; differences from then on belong to that time. Thus a thread that
+ * stopped between its look at the clock and its add loses nothing.
  *
  * Chunks. A chunk holds kBHChunkRecords records, in the order in which threads reserved them:
  * value (a double), then mark: key number (bits 0-15) and time (bits 16-62, bit 63 undated). The
@@ -41,17 +41,17 @@
  * generation to kBHChunkAcknowledged; only then does the process use the chunk again, with a
  * generation that is larger by two.
  *
- * A reader that has acknowledged what it could advances kBHHeaderFolds by one: space may be free.
+ * A reader that has acknowledged all it could advances kBHHeaderFolds by one: space may be free.
  *
- * What a kill leaves: a missing magic (an empty segment), an unused key, cell or chunk, a record
- * without a mark. Each counts as nothing.
+ * A kill can leave a missing magic (an empty segment), an unused key, cell or chunk, or a record
+ * without a mark. Readers ignore each of these.
  *
- * Retiring. Nobody can write to a segment any more when no descriptor that may write and no shared
- * mapping of it exists. The kernel says so exactly: on a descriptor opened for reading,
- * fcntl(F_SETLEASE, F_RDLCK) fails with EAGAIN while there is a writer, in whichever PID namespace
+ * Retiring. Nobody can write to a segment any more when no descriptor open for writing and no
+ * shared mapping of it exists. The kernel tells exactly: on a descriptor opened for reading,
+ * fcntl(F_SETLEASE, F_RDLCK) fails with EAGAIN while there is a writer, whatever its PID namespace
  * and whether or not the process closed its descriptors. (Set F_SETSIG to SIGURG first, and remove
  * the lease at once.) A process never opens a segment that exists. A child of fork inherits the
- * mapping, and gives it up with its first value, or with exec. Where leases do not work the header
+ * mapping, and gives it up with its first value, or with exec. Where leases do not work, the header
  * names the process: PID namespace, PID and start time as in /proc/PID/stat; it is gone when the
  * reader is in the same namespace and no such process exists.
  */

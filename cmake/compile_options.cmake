@@ -27,9 +27,9 @@ if(TAVREL_FUZZ)
   target_link_options(tavrel_options INTERFACE -fsanitize=address,undefined)
 endif()
 
-# What distributions harden their programs with. The sanitizers have checks of their own instead.
-# _FORTIFY_SOURCE works only in optimised builds; without a build type a packager's flags say it.
-# Nobody replaces a function of ours, so that position-independent code may be inlined.
+# The flags with which distributions harden programs. The sanitizers have their own checks instead.
+# _FORTIFY_SOURCE works only in optimised builds; without a build type, a packager's flags set it.
+# Nobody replaces our functions, so that position-independent code may be inlined.
 if(TAVREL_HARDENING AND NOT TAVREL_SANITIZE AND NOT TAVREL_FUZZ)
   set(CMAKE_POSITION_INDEPENDENT_CODE ON)
   include(CheckPIESupported)

@@ -2,7 +2,7 @@
 // applications.
 //
 // A message is a dictionary with a number "operation". One that lacks what its operation needs is
-// ignored. Nothing is ever answered.
+// ignored. No message is answered.
 #pragma once
 
 #include <cstdint>
@@ -26,9 +26,9 @@ inline constexpr std::int32_t kDeliverAppInfo = 2;  // the information in "app_d
 /// listener is released. Null when the service cannot be had. The platform must outlive it.
 std::unique_ptr<ServiceListener> startAppInfoListener(Platform& platform);
 
-/// Handles one event of a peer; what is no message is ignored. The first message of the process
-/// with an operation other than 2, known or not, fires a guard: later ones are ignored with a debug
-/// line.
+/// Handles one event of a peer; ignores anything but a message. The first message of the process
+/// with an operation other than 2, known or not, uses up its one request: later ones are ignored
+/// with a debug line.
 void handleAppInfoMessage(Platform& platform, const plist::Value& event);
 
 }  // namespace tavrel

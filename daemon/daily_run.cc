@@ -18,7 +18,7 @@ struct DailyWork {
   std::int32_t day;
   const plist::Array& appInfo;
   const StepObserver& onStep;
-  LogOutcome logOutcome = LogOutcome::NotFiled;  // until the report has come to its end
+  LogOutcome logOutcome = LogOutcome::NotFiled;  // until the report is finished
 };
 
 void report(DailyWork& work) {
@@ -26,7 +26,7 @@ void report(DailyWork& work) {
   work.logOutcome = platform.submission->isDiagnosticSubmissionEnabled()
                         ? BHReport(platform).writeLogForYesterday(work.day, work.appInfo)
                         : LogOutcome::NotPermitted;
-  // A log that could not be filed has its error already.
+  // The error of a log that could not be filed is already logged.
   if (work.logOutcome == LogOutcome::Filed || work.logOutcome == LogOutcome::NotFiled) return;
   platform.log->write(LogLevel::Info, logOutcomeText(work.logOutcome, std::to_string(work.day)));
 }
@@ -51,7 +51,7 @@ constexpr DailyTask kDailyTasks[] = {
      [](DailyWork& work) { work.platform.crashReporting->rollNorvaneCareLogs(); }},
 };
 
-/// A longer gap between two runs is a clock that was set, not days of use.
+/// A longer gap between two runs means that the clock was set.
 constexpr std::int64_t kLongestGapDays = 3660;
 
 void noteDaysPassedOver(SystemLog& log, std::int64_t lastRunDay, std::int32_t yesterday) {

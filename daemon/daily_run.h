@@ -13,12 +13,12 @@ namespace tavrel {
 
 /// The gated run: does yesterday's tasks unless they are done, and remembers the day. `appInfo` is
 /// the list of activated applications, an empty handle when there is none. `onStep` hears of the
-/// gate, of each task, and of the end. Yields how the log came out, nothing when the day was done.
+/// gate, of each task, and of the end. Yields the outcome of the log; nothing if the day was done.
 std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Array& appInfo,
                                            const StepObserver& onStep = {});
 
 /// The tasks for one day, without the gate. No task's failure, not even an exception, stops the
-/// ones after it. Yields how the log came out, which an info line says when there is none.
+/// ones after it. Yields the outcome of the log; when no log was filed, an info line says why.
 LogOutcome dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
                             const StepObserver& onStep = {});
 

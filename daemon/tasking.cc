@@ -56,7 +56,7 @@ plist::Value systemBuild(Platform& platform) {
   return platform.systemVersion->systemVersionDictionary().get(kProductBuildVersionKey);
 }
 
-/// The scheduled tasking beside the applied one.
+/// The scheduled and the applied tasking.
 struct TaskingPlan {
   TaskingPlan(Platform& platform, const plist::Value& build)
       : scheduled(
@@ -83,7 +83,7 @@ struct TaskingPlan {
  private:
   /// Empty when it can be. Settings that are applied and not remembered could never be undone.
   std::string whyNotRemembered(PropertyListCoding& propertyLists) const {
-    if (!scheduled.array(kTaskingPayloadKey)) return {};  // nothing is
+    if (!scheduled.array(kTaskingPayloadKey)) return {};  // no settings to remember
     auto kept = plist::Dictionary::create();
     for (const auto key : {kTaskingIDKey, kTaskingDigestKey, kTaskingPayloadKey})
       kept.set(key, scheduled.get(key));

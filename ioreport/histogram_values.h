@@ -1,5 +1,5 @@
-// The values of histogram channels, one element per bucket. sample_values.h says what is answered
-// for a channel of another format and an index out of range.
+// The values of histogram channels, one element per bucket. sample_values.h says what accessors
+// return for a channel of another format and an index out of range.
 #pragma once
 
 #include <cstdint>

@@ -4,8 +4,8 @@
 //   const std::int64_t reads = IOReportSimpleGetIntegerValue(channel, &unit);
 //   if (reads != kInvalidValue) ...
 //
-// Every accessor, those of histograms and states too, looks whether the channel is of its format
-// and the index in range, and answers a fixed value when not: `kInvalidValue` for values and ids,
+// Every accessor, also of histograms and states, checks that the channel has its format and that
+// the index is in range, and otherwise returns a fixed value: `kInvalidValue` for values and ids,
 // -1 for counts and indexes, not-a-number for a duty cycle, nothing for a name. None of them
 // copies.
 #pragma once

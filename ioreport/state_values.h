@@ -1,5 +1,5 @@
-// The values of state channels, one element per state. sample_values.h says what is answered for a
-// channel of another format and an index out of range.
+// The values of state channels, one element per state. sample_values.h says what accessors return
+// for a channel of another format and an index out of range.
 #pragma once
 
 #include <cstddef>
@@ -28,12 +28,12 @@ std::optional<std::string_view> IOReportStateGetNameForIndex(const plist::Dictio
 std::int64_t IOReportStateGetInTransitions(const plist::Dictionary& channel, std::int32_t index);
 /// How long it lasted altogether, unsigned, in the channel's unit.
 std::int64_t IOReportStateGetResidency(const plist::Dictionary& channel, std::int32_t index);
-/// Its residency as a fraction of that of all states.
+/// Its residency as a fraction of the residency of all states.
 double IOReportStateGetDutyCycle(const plist::Dictionary& channel, std::int32_t index);
-/// The state whose element has the latest timestamp, the first of them; -1 when none has any.
+/// The first of the states whose element has the latest timestamp; -1 when none has a timestamp.
 std::int32_t IOReportStateGetCurrent(const plist::Dictionary& channel);
 
-// -- Over all the states of a channel, for those that need it of many of them -------------------
+// -- All states of a channel at once, for callers that need many of them -------------------------
 
 /// The names of all states, which are kept in the channel; an empty handle when one has none.
 plist::Array stateNames(const plist::Dictionary& channel);

@@ -1,4 +1,4 @@
-// For work whose failure must not stop what follows it, such as that of destructors.
+// For work whose failure must not stop what follows, for example in destructors.
 #pragma once
 
 #include <exception>
@@ -18,7 +18,7 @@ void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
       log.log(LogLevel::Error, "cannot %s: %s", what, failure.what());
     }
   } catch (...) {
-    // There is no memory left even for the line.
+    // Not even the line found memory.
   }
 }
 

@@ -36,7 +36,7 @@ class ServiceListener {
 class NamedServices {
  public:
   virtual ~NamedServices() = default;
-  /// Null when the listener cannot be made; only a debug message gives the reason.
+  /// Null when the listener cannot be made; the system log has the reason.
   virtual std::unique_ptr<ServiceListener> createListener(std::string_view name) = 0;
 };
 

@@ -1,5 +1,5 @@
-// Names of what stands in the preferences, for everybody who reads or writes it: the daemon's
-// state, and what others decide for it.
+// Names of the preferences that last, for all code that reads or writes them: the daemon's state,
+// and what others decide for it.
 #pragma once
 
 #include <string_view>
@@ -12,7 +12,7 @@ inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
 /// Integer: the last day that the gated run has done.
 inline constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
-/// String: how the log of that run came out, a name of report/log_outcome.h.
+/// String: what became of that run's log, a name from report/log_outcome.h.
 inline constexpr std::string_view kLastLogOutcomeKey = "LastLogOutcome";
 
 /// String: the OS version at the last log.

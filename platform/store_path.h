@@ -1,4 +1,4 @@
-// Where the statistics store stands, for those who open it and those who measure it.
+// The location of the statistics store, for code that opens it and code that measures it.
 #pragma once
 
 #include <string_view>

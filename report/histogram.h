@@ -18,12 +18,12 @@ namespace tavrel {
 /// The index of the bucket of `value`, by a walk over boundaries in the order of the whitelist.
 std::uint32_t determineHistBucketForValue(double value, const plist::Array& withIntervals);
 
-/// The labels of buckets. Rows that follow one another mostly have the same boundaries, so the
-/// labels of the boundaries that were last chosen are kept, and only those.
+/// The labels of buckets. Successive rows mostly have the same boundaries, so the labels of the
+/// last chosen boundaries are kept, and only those.
 class HistogramLabels {
  public:
   void choose(const plist::Array& intervals);
-  /// The label of a bucket of the chosen boundaries, made when it is first asked for.
+  /// The label of a bucket of the chosen boundaries, made on first use.
   const plist::String& of(std::size_t bucket);
 
  private:

@@ -1,4 +1,4 @@
-// How the log of a day came out, in the words that daemon and tool share.
+// What became of the log of a day, in the words that daemon and tool share.
 #pragma once
 
 #include <cstdint>
@@ -25,12 +25,12 @@ std::string logOutcomeText(LogOutcome outcome, std::string_view day);
 /// Its name in preferences and JSON, such as "not-permitted".
 std::string_view nameOf(LogOutcome outcome);
 
-/// What would keep a run from filing a log, as far as can be told without making one.
+/// What would keep a run from filing a log, as far as is known without making one.
 std::optional<LogOutcome> obstacleToLog(Platform& platform);
 
-/// The outcome of the last gated run, kept in the daemon's own domain. Nothing when none is known.
+/// The outcome of the last gated run, kept in the daemon's own domain; nothing when unknown.
 std::optional<LogOutcome> lastLogOutcome(Preferences& preferences);
-/// Sets the preference where it changes; synchronising the domain is the caller's business.
+/// Sets the preference if it changes. The caller synchronises the domain.
 void rememberLogOutcome(Preferences& preferences, LogOutcome outcome);
 
 }  // namespace tavrel

@@ -16,7 +16,7 @@ namespace {
 constexpr int kThreads = 8;
 constexpr int kPerThread = 40'000;
 
-// All numbers from 0 up, each once, but for as many as were dropped.
+// All numbers from 0 up, each once, except for as many as were dropped.
 void expectEachOnce(std::vector<double> values, std::uint64_t expected, std::uint64_t dropped) {
   EXPECT_EQ(values.size() + dropped, expected);
   std::sort(values.begin(), values.end());

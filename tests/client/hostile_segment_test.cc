@@ -1,4 +1,4 @@
-// Segments that no honest program leaves.
+// Segments that no honest program would leave.
 #include <limits>
 #include <random>
 
@@ -40,7 +40,7 @@ class HostileSegment : public Recording {
     EXPECT_EQ(pwrite(file_.get(), original_.data(), original_.size(), 0), 0xd0000);
   }
 
-  /// The error, else what was read: "SCALARS RECORDS REFUSED".
+  /// The error, or what was read: "SCALARS RECORDS REFUSED".
   std::string readAll(bool writerIsGone = true) {
     scalars.clear();
     records.clear();

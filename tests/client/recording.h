@@ -33,7 +33,7 @@ struct TestClock {
 };
 TestClock& testClock();
 
-/// Memory of which children see changes.
+/// Memory whose changes children see.
 template <class T>
 T& shared() {
   void* memory =

@@ -56,7 +56,7 @@ struct ListenerTest : ::testing::Test {
   }
 
   /// Serves clients that send these events in one process, and yields what was logged between the
-  /// start and the end, without what every run says of a device without storage and permission.
+  /// start and the end, without what each run logs on a device without storage and permission.
   Messages serve(const std::vector<plist::Value>& events) {
     fake.journal.clear();
     fake.log.entries.clear();

@@ -106,7 +106,7 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   EXPECT_TRUE(device.log.lines.back().ends_with("05.event.unusable: Is a directory"));
 }
 
-// Ten events a run, and none behind one that was not filed; what is left waits for the next run.
+// Ten events per run, and none after one that was not filed; the rest waits for the next run.
 TEST(EccEvents, LeaveTheQueueWhenTheyAreFiled) {
   EccDevice device;
   for (char i = 0; i < 12; ++i)

@@ -15,7 +15,7 @@ namespace {
 using namespace std::string_literals;
 
 // A document of objects given as bytes, with references of one byte and offsets of some; the first
-// object is the root and stands at offset 8.
+// object is the root, at offset 8.
 std::string document(const std::vector<std::string>& objects, std::size_t offsetWidth = 1) {
   std::string out = "bplist00";
   const auto appendOffset = [&out](std::string& to, std::size_t width) {

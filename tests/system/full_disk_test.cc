@@ -60,7 +60,7 @@ class SmallDisk {
   bool isMounted_ = false;
 };
 
-// SQLite would store into a hole of its index and be killed by SIGBUS at some of these sizes.
+// At some of these sizes SQLite would write into a hole of its index and be killed by SIGBUS.
 TEST(FullDiskTest, NoSignalEndsARunAndNothingIsLost) {
   constexpr int kEvents = 2;
   int kept = 0;

@@ -1,4 +1,4 @@
-// Text and JSON of a command tell the same facts: every figure of the text is in the JSON.
+// Text and JSON of a command have the same facts: each figure of the text is in the JSON.
 #include <array>
 #include <charconv>
 #include <cmath>
@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// Units that text converts to: one of them is so many of what JSON counts.
+// Units in the text, with how many of the JSON's units make one of them.
 constexpr std::pair<std::string_view, double> kUnits[] = {
     {"%", 0.01},     {"KiB", 0x1p10}, {"MiB", 0x1p20}, {"GiB", 0x1p30}, {"TiB", 0x1p40},
     {"PiB", 0x1p50}, {"EiB", 0x1p60}, {"ns", 1e-9},    {"µs", 1e-6},    {"ms", 1e-3},

@@ -297,7 +297,7 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   }
 }
 
-// Takes two seconds between readings, and changes the machine meanwhile.
+// Takes two seconds between readings, and changes the machine in the meantime.
 class SlowPace final : public CollectPace {
  public:
   explicit SlowPace(std::function<void()> change) : change_(std::move(change)) {}

@@ -36,7 +36,7 @@ bool isRegular(FiledLog& log) {
   return !log.status || S_ISREG(log.status->st_mode);
 }
 
-// The logs of both folders as their names tell them.
+// The logs of both folders, as their file names describe them.
 Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
   std::vector<FiledLog> logs;
   for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
@@ -106,7 +106,7 @@ Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_vi
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name) {
   auto files = filesOfLogs(context);
   if (!files) return std::nullopt;
-  // One that stands in both folders, as after a power cut, still waits.
+  // A log that is in both folders, for example after a power cut, still waits.
   const auto found = std::find_if(files->rbegin(), files->rend(), [&](FiledLog& log) {
     return (name == log.path || name == log.name || name == fileNameOf(log)) && isRegular(log);
   });

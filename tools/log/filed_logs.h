@@ -27,8 +27,8 @@ std::string fileNameOf(const FiledLog& log);
 /// The logs of both folders, oldest first.
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context);
 
-/// The newest log whose name begins with `namePrefix` and that `accepts` takes, chosen by the names
-/// of files: metadata is read of few. Nothing when there is none.
+/// The newest log whose name begins with `namePrefix` and that `accepts` takes. It is chosen by
+/// file names, so few metadata files are read. Nothing when there is none.
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts);
 

@@ -1,5 +1,5 @@
-// What is known of the daily log without making one: what stands in the way of the next, or how the
-// last one came out.
+// What is known of the daily log without making one: what prevents the next one, or what became of
+// the last.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@
 namespace tavrel {
 
 struct LogConclusion {
-  bool isOfNextRun = false;           // else of the last gated one
+  bool isOfNextRun = false;           // otherwise of the last gated one
   std::optional<std::int32_t> day;    // nothing before the first run
   std::optional<LogOutcome> outcome;  // nothing when it is not known
 
@@ -20,7 +20,7 @@ struct LogConclusion {
   const char* run() const { return isOfNextRun ? "next" : "last"; }
   /// Such as "no log for day 20781 (2026-11-24): no usable whitelist".
   std::string text() const;
-  /// {"run": "next", "day": 20781, "outcome": "no-whitelist"}, null for what is not known.
+  /// {"run": "next", "day": 20781, "outcome": "no-whitelist"}, with null for unknown parts.
   Json json() const;
 };
 

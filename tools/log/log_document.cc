@@ -44,14 +44,14 @@ void printTitle(const Page& page, std::string_view title, std::size_t count) {
   page.out << '\n' << page.styled(format("%s (%zu)", title, count), Emphasis::Strong) << '\n';
 }
 
-// Pairs of keys whose first tells how much of the second is free.
+// Pairs of keys; the first says how much of the second is free.
 constexpr std::pair<std::string_view, std::string_view> kDisks[] = {
     {"com.norvane.lumenhall.DiskUsageUserBlocksFree",
      "com.norvane.lumenhall.DiskUsageUserTotalBlocks"},
     {"com.norvane.usage.disk.free_mib", "com.norvane.usage.disk.total_mib"},
 };
 
-// Less free than this part of a disk is worth a look.
+// A disk with a smaller free share than this is marked.
 constexpr double kShortShare = 0.1;
 
 Emphasis emphasisOf(const plist::Entry& entry, const plist::Dictionary& values) {

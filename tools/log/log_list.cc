@@ -30,7 +30,7 @@ std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log) {
   return document ? dayOfLog(document->dictionary()) : std::nullopt;
 }
 
-// Nothing records whether a run was forced, but the gated one reports the day before its own.
+// Nothing records whether a run was forced, but a gated run reports the day before its own.
 bool isSurelyForced(const FiledLog& log, std::optional<std::int32_t> day) {
   const auto filed = log.metadata.date(kLogMetadataTime);
   if (!day || !filed) return false;

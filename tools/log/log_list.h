@@ -12,8 +12,8 @@ namespace tavrel {
 /// Prints the logs of both folders, oldest first, with the day that each reports.
 void listLogs(ToolContext& context);
 
-/// The one filed log whose name begins with `name`; a file of this machine, "-" being standard
-/// input, when none does. The error says how many there are.
+/// The one filed log whose name begins with `name`. When there is none, a file of this machine, or
+/// standard input for "-". When there are several, the error says how many.
 Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name);
 
 }  // namespace tavrel

@@ -194,7 +194,7 @@ void print(ToolContext& context, const LogEnvelope& envelope, const NandLog& log
   out << '\n';
 }
 
-// Without metadata, as where it may not be read, the name of the file tells.
+// Without metadata, for example when it may not be read, the file name decides.
 bool isNandLog(const FiledLog& log) {
   if (log.metadata.empty()) return log.name.starts_with(kNandLogName);
   return log.metadata.string(kLogMetadataName) == kNandLogName &&

@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::uint64_t kSectorBytes = 4096;  // of logical traffic
 constexpr std::int64_t kDaysTo2000 = 10957;   // since 1970
-// Fewer keys with one stem are figures of their own.
+// Fewer keys with one stem are shown one by one.
 constexpr std::size_t kFewestBuckets = 3;
 
 constexpr std::uint64_t kMostWeeks = 1'000'000;

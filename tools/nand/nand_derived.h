@@ -14,7 +14,7 @@
 
 namespace tavrel {
 
-/// Nothing where a figure is missing or negative, a divisor is 0, or a size is beyond 64 bits.
+/// Nothing where a figure is missing or negative, a divisor is 0, or a size exceeds 64 bits.
 struct NandDerived {
   explicit NandDerived(const plist::Dictionary& info);
 
@@ -26,24 +26,24 @@ struct NandDerived {
   std::optional<double> freeNodesShare;
   std::optional<double> writeAmplification;  // bytes of erased virtual blocks / logical writes
   std::optional<CivilDate> formattedFrom;    // first day of the week of formatting
-  /// Figures that are 0, but for those of a histogram that holds something.
+  /// Figures that are 0, except those of a histogram that is not empty.
   std::size_t zeros = 0;
 };
 
 struct NandBucket {
   std::string_view key;
-  std::uint64_t number;  // behind the stem of the key
+  std::uint64_t number;  // after the stem of the key
   std::uint64_t count;
 };
 
-/// By stem, in the order of their numbers: keys with one stem and three or more numbers behind it.
-/// Keys stand without the common prefix, borrowed from the dictionary.
+/// By stem, in the order of their numbers: keys that have one stem and differ in three or more
+/// numbers after it. Keys lack the common prefix and are borrowed from the dictionary.
 std::map<std::string_view, std::vector<NandBucket>> nandHistograms(const plist::Dictionary& info);
 
-/// The figure of that key, which stands without the common prefix; nothing when it is negative.
+/// The figure of that key, given without the common prefix; nothing when it is negative.
 std::optional<std::uint64_t> nandFigure(const plist::Dictionary& info, std::string_view key);
 
-/// Null for what is not known. Shares are parts of 1.
+/// Unknown values are null. Shares are fractions of 1.
 Json jsonOf(const NandDerived& derived);
 
 }  // namespace tavrel

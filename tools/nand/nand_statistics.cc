@@ -24,11 +24,11 @@ struct Record {
 
   std::size_t count() const { return values.size() / kUnitBytes; }
   std::uint64_t value(std::size_t i) const { return *loadLittle64(values, i * kUnitBytes); }
-  /// Whether the parser lists all of it: under its name, one value an entry.
+  /// Whether the parser lists all of it: under its name, one value per entry.
   bool isListed() const { return statistic && count() > 0 && count() <= statistic->cap; }
 };
 
-// Walks the records up to the first that is broken. Says why it is.
+// Walks the records up to the first broken one, and says what is wrong with that.
 template <class Visit>
 std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
   const std::uint64_t end = buffer.size() / kUnitBytes * kUnitBytes;
@@ -53,7 +53,8 @@ std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
   return std::nullopt;
 }
 
-// As `nand build` reads them. What is not listed is a record of its own, so that nothing is lost.
+// The form that `nand build` reads. What the parser does not list becomes a record of its own, so
+// that nothing is lost.
 void addEntries(JsonList& entries, const Record& record) {
   if (!record.isListed()) {
     // A record may fill the whole buffer; as text it needs no more than its digits.

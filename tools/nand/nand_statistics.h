@@ -15,11 +15,11 @@
 namespace tavrel {
 
 /// {"result": …, "fields": {…}, "entries": [[name, value], …]}, with every record of the buffer up
-/// to the first that is broken: `nand build` makes the same bytes of it.
+/// to the first broken one: `nand build` makes the same bytes from it.
 void printStatisticsJson(std::ostream& out, int result, const ASPContext& context, ByteSpan buffer);
 
-/// One line a statistic, in the order of the buffer. Answers how many records are not listed, or
-/// not wholly: those of unknown statistics, without values, or with too many.
+/// One line per statistic, in the order of the buffer. Returns how many records are not listed, or
+/// not completely: those of unknown statistics, without values, or with too many.
 std::size_t printStatistics(const Page& page, const ASPContext& context, ByteSpan buffer);
 
 /// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for a good buffer.

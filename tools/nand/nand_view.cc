@@ -23,7 +23,7 @@
 namespace tavrel {
 namespace {
 
-// Less of the flash that is free is worth a look.
+// A flash with a smaller free share than this is marked.
 constexpr double kShortShare = 0.05;
 
 struct Group {

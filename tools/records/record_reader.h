@@ -18,9 +18,9 @@ class RecordReader {
 
   explicit RecordReader(std::string path) : path_(std::move(path)) {}
 
-  /// The lines that came since the last call. A line of more than
-  /// `limits::kStructuredRecordFileBytes` is an error. Lines that a kill or a power cut tore are
-  /// left out: those of zero bytes, and, when the file `isComplete`, a last one without its end.
+  /// The lines that were added since the last call. A line of more than
+  /// `limits::kStructuredRecordFileBytes` is an error. Lines torn by a kill or a power cut are left
+  /// out: those of zero bytes and, when the file `isComplete`, a last one without its end.
   Status read(bool isComplete, const LineHandler& handler);
   /// An error when lines were left out as torn.
   Status wholeness() const;

@@ -93,7 +93,7 @@ void list(ToolContext& context, const Arguments&) {
   }
   if (context.json()) return context.printJson({{"services", std::move(services)}});
   if (table.empty()) {
-    // Recordings that cannot be read have been complained of.
+    // Unreadable recordings have already been reported.
     if (context.hasComplaints()) return;
     context.out() << "no drivers: recordings of them belong in "
                   << printable(context.root().path(kRecordingFolder)) << '\n';

@@ -23,12 +23,12 @@ void wordOrNull(JsonWriter& json, std::int64_t word) {
   if (word == kInvalidValue) return json.null();
   json.integer(static_cast<std::uint64_t>(word));
 }
-// Counts are unsigned, but for their differences.
+// Counts are unsigned, but their differences are not.
 void countOrNull(JsonWriter& json, std::int64_t count, bool isDelta) {
   if (isDelta) return valueOrNull(json, count);
   wordOrNull(json, count);
 }
-// Of bounds every word is one.
+// In an array of bounds every word is a bound.
 void boundOrNull(JsonWriter& json, std::int64_t bound, bool hasBounds) {
   if (hasBounds) return json.integer(static_cast<std::uint64_t>(bound));
   json.null();
@@ -75,7 +75,7 @@ void writeStates(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
     countOrNull(json.member("in_transitions"), elements.value(i, kStateInTransitions), isDelta);
     const std::int64_t residency = elements.value(i, kStateResidency);
     countOrNull(json.member("residency"), residency, isDelta);
-    // A negative one is none.
+    // A negative count counts nothing.
     writeConverted(json.member("converted"), channel, residency < 0 ? kInvalidValue : residency);
     json.member("duty_cycle").real(duty);
     json.member("current").boolean(state == current);
@@ -150,7 +150,7 @@ void writeSample(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
   }
 }
 
-// One writer for all, so that its buffer is used again.
+// One writer for all, so that they share its buffer.
 template <class Write>
 void addEach(JsonList& list, const plist::Dictionary& channels, const Write& write) {
   JsonWriter json = list.elementWriter();

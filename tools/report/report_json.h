@@ -10,7 +10,7 @@ namespace tavrel {
 void addChannels(JsonList& list, const plist::Dictionary& channels);
 
 /// The same with timestamp and "value", "values", "states" or "buckets" according to the format.
-/// "converted" has a value and its unit as people know them, "bytes", "°C" or an SI unit.
+/// "converted" has a value in a familiar unit: "bytes", "°C" or an SI unit.
 /// What a channel does not tell is null. Counts of a delta are differences, and may be negative.
 void addSamples(JsonList& list, const plist::Dictionary& samples, bool isDelta);
 

@@ -1,4 +1,4 @@
-// Values of channels in the units that people know.
+// Values of channels in familiar units.
 #pragma once
 
 #include <cstdint>
@@ -16,7 +16,7 @@ struct ConvertedValue {
   std::string_view unit;
 };
 
-/// What `value` is in the unit of its channel. Nothing for counts and for units that cannot be
+/// Converts `value` from the unit of its channel. Nothing for counts and for units that cannot be
 /// converted.
 std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, std::int64_t value);
 

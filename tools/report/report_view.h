@@ -9,7 +9,7 @@ namespace tavrel {
 /// A tree by driver, group and subgroup, or with `flat` a table of one line a channel.
 void printChannels(const Page& page, const plist::Dictionary& channels, bool flat);
 
-/// The values of sampled channels, in units that people know. Counts of a delta are differences,
+/// The values of sampled channels, in familiar units. Counts of a delta are differences,
 /// and may be negative.
 void printSamples(const Page& page, const plist::Dictionary& samples, bool isDelta);
 

@@ -1,8 +1,8 @@
 // Subcommands and their options, over CLI11; only command.cc and tavrelctl.cc include its headers.
 //
-//   const Command group = top.addGroup("log", "Show submitted logs") const;
-//   const Command list = group.addCommand("list", "List the pending logs") const;
-//   list.addOption("--day", arguments->day, "Only those of one day").typeName("DAY") const;
+//   const Command group = top.addGroup("log", "Show submitted logs");
+//   const Command list = group.addCommand("list", "List the pending logs");
+//   list.addOption("--day", arguments->day, "Only those of one day").typeName("DAY");
 //   list.onRun([&context, arguments] { ... });
 //
 // Both classes are handles: a copy names the same command or option. The targets of options must

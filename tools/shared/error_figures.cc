@@ -8,7 +8,7 @@ namespace {
 
 constexpr std::string_view kNandPrefix = "com.norvane.NANDInfo.";
 
-// What the keys begin with.
+// The prefixes of the keys.
 constexpr std::string_view kErrorFigures[] = {
     "FailedReconstruction",
     "raidFailed",

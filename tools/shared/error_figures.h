@@ -1,11 +1,11 @@
-// Which figures count errors, so that views can point at those that are not 0.
+// Which figures count errors, so that views can mark those that are not 0.
 #pragma once
 
 #include <string_view>
 
 namespace tavrel {
 
-/// `key` is one of the NAND information, with or without its common prefix, or a scalar of a log.
+/// `key` is a key of the NAND information, with or without its common prefix, or a scalar of a log.
 bool isErrorFigure(std::string_view key);
 
 }  // namespace tavrel

@@ -1,5 +1,5 @@
-// Writes JSON straight into text, for long lists: a tree of values takes several times as long to
-// build and free as its text takes to write.
+// Writes JSON directly as text, for long lists: building and freeing a tree of values takes several
+// times as long as writing its text.
 //
 //   json.beginObject();
 //   json.member("name").text(name);
@@ -8,7 +8,7 @@
 //   json.endArray();
 //   json.endObject();
 //
-// The text is that of `jsonText` for the same values. Names of members are written as they are.
+// The text is the one that `jsonText` gives for the same values. Names of members are not escaped.
 #pragma once
 
 #include <cstddef>
@@ -21,7 +21,7 @@ namespace tavrel {
 
 class JsonWriter {
  public:
-  /// Lines are indented, by `indent` blanks and more as values nest; without, all is one line.
+  /// Lines are indented by `indent` spaces, and more as values nest. Without it, all is one line.
   explicit JsonWriter(std::optional<std::size_t> indent) : indent_(indent) {}
 
   /// What was written; the next value begins a new text after `clear`.
@@ -41,9 +41,9 @@ class JsonWriter {
   void boolean(bool value) { text_ += value ? "true" : "false"; }
   void integer(std::int64_t value);
   void integer(std::uint64_t value);
-  /// Null for what is no number.
+  /// Not-a-number and infinities become null.
   void real(double value);
-  /// Text that is no UTF-8 is repaired.
+  /// Malformed UTF-8 is repaired.
   void text(std::string_view value);
 
  private:

@@ -1,4 +1,4 @@
-// Where text for people goes, what is known of the terminal there, and how text stands out on it.
+// The output for text that people read: its stream, what is known of the terminal, and emphasis.
 #pragma once
 
 #include <cstddef>
@@ -10,7 +10,7 @@
 
 namespace tavrel {
 
-/// Titles are strong; what somebody should look into is an alarm.
+/// Titles are strong; figures that somebody should look into are alarms.
 enum class Emphasis : std::uint8_t { None, Strong, Alarm };
 
 struct Page {
@@ -20,10 +20,11 @@ struct Page {
   /// Whether the terminal shows colours, and the user wants them.
   bool isColoured = false;
 
-  /// What bars have room in: the same in every pipe.
+  /// The columns for lines with bars: the same in every pipe.
   std::size_t barColumns() const { return columns.value_or(80); }
 
-  /// `text`, which is printable, between the terminal's own marks. Without colours as it is.
+  /// `text`, which must be printable, between the terminal's control sequences; unchanged without
+  /// colours.
   std::string styled(std::string_view text, Emphasis emphasis) const;
 };
 

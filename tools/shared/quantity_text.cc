@@ -13,7 +13,7 @@ constexpr std::string_view kPrefixes[] = {"p", "n", "µ", "m", "", "k", "M", "G"
 constexpr int kNoPrefix = 4;
 constexpr int kLargestPrefix = 8;
 
-// Halves go away from zero: 41.25 is 41.3.
+// Halves round away from zero: 41.25 gives 41.3.
 std::string significant(double value) {
   if (value == 0 || !std::isfinite(value)) return numberText(value);
   const double digits = std::max(0.0, 2 - std::floor(std::log10(std::abs(value))));
@@ -26,7 +26,7 @@ std::string significant(double value) {
 std::string sizeText(double bytes) {
   constexpr std::string_view kUnits[] = {"bytes", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
   std::size_t unit = 0;
-  // What would be rounded to 1024.0 is one of the next unit.
+  // What would round to 1024.0 is shown in the next unit.
   for (double next = 1024; std::abs(bytes) >= next && unit + 1 < std::size(kUnits); ++unit) {
     bytes /= 1024;
     next = 1023.95;

@@ -125,7 +125,7 @@ std::vector<std::size_t> Table::widths(const Page& page) const {
 void Table::printRow(const Page& page, const std::vector<Cell>& row,
                      const std::vector<std::size_t>& widths) const {
   std::string line(indent_, ' ');
-  std::size_t blanks = 0;  // that are owed to what follows
+  std::size_t blanks = 0;  // to print before what follows
   for (std::size_t i = 0; i < columns_.size(); ++i) {
     if (i > 0) blanks += kGap.size();
     std::string shown = row[i].text;

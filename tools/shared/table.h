@@ -26,7 +26,7 @@ std::string counted(std::uint64_t count, std::string_view what);
 /// Rows of texts in aligned columns, two blanks between them.
 class Table {
  public:
-  /// Text to the left or to the right; text that is never cut; bars.
+  /// Left-aligned or right-aligned text, text that is never cut, or bars.
   enum class Align : std::uint8_t { Left, Right, Whole, Bar };
   struct Column {
     std::string title;
@@ -36,7 +36,7 @@ class Table {
     Cell(const char* cellText) : text(cellText) {}
     Cell(std::string cellText, Emphasis cellEmphasis = Emphasis::None)
         : text(std::move(cellText)), emphasis(cellEmphasis) {}
-    /// A bar of `value` out of `largest` of what the column has room for: at least one mark unless
+    /// A bar that fills `value` out of `largest` of its column; at least one mark unless `value` is
     /// 0.
     static Cell bar(double value, double largest);
 

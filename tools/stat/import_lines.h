@@ -36,7 +36,7 @@ class ImportParser {
  public:
   using Sink = std::function<Status(const ImportLine& line)>;
 
-  /// `today`: the number of the day that "today" means.
+  /// `today` is the number of the day that "today" means.
   explicit ImportParser(std::int32_t today) : today_(today) {}
 
   /// Takes the next bytes. Stops at the first line that is bad or that the sink refuses.

@@ -16,7 +16,7 @@
 namespace tavrel {
 namespace {
 
-// Rows held back for the widths of their columns. A longer list has widths that fit every row.
+// Rows that are held back to measure their columns. In a longer list the widths fit any row.
 constexpr std::size_t kRowsMeasured = 1024;
 constexpr std::size_t kBytesMeasured = 256U << 10;
 
@@ -70,7 +70,7 @@ void appendNumber(std::string& out, std::int64_t number) {
   out.append(digits, end);
 }
 
-// The table. The key stands last, so that a long one shifts nothing.
+// The table. The key is the last column, so that a long one shifts no other.
 class TableWriter {
  public:
   TableWriter(LineWriter& lines, std::optional<std::size_t> columns, std::size_t widestDay)
@@ -90,7 +90,7 @@ class TableWriter {
     measure(row);
   }
 
-  /// False when there was no row.
+  /// False when there were no rows.
   bool finish() {
     if (!isMeasured_ && !rows_.empty()) writeMeasured();
     return isMeasured_;
@@ -183,13 +183,13 @@ class TableWriter {
   DayTexts days_;
   Widths widths_;
   bool isMeasured_ = false;
-  std::vector<Row> rows_;  // until they are measured; their keys stand in `keys_`
+  std::vector<Row> rows_;  // until they are measured; `keys_` has their keys
   std::vector<std::size_t> keySizes_;
   std::string keys_;
   std::string value_;
 };
 
-// The rows as elements of a JSON list, written as the library that writes the rest would.
+// The rows as elements of a JSON list, in the form that the JSON library gives the rest.
 class JsonWriter {
  public:
   explicit JsonWriter(LineWriter& lines) : lines_(lines) {}
@@ -222,7 +222,7 @@ class JsonWriter {
   bool isEmpty_ = true;
 };
 
-// Hands every row to `add`, scalars first; `between` is called after them.
+// Passes each row to `add`, scalars first, and calls `between` after the scalars.
 template <class Add, class Between>
 Status walk(SqliteHistory& history, const Selection& selection, LineWriter& lines, Add add,
             Between between) {

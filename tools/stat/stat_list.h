@@ -1,4 +1,4 @@
-// What the store holds, as a table or as JSON, printed while it is read.
+// The content of the store as a table or as JSON, printed while it is read.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +9,7 @@
 
 namespace tavrel {
 
-/// Lists what is held of the keys that begin with `prefix`, of one day or of all.
+/// Lists the statistics whose keys begin with `prefix`, of one day or of all.
 void listStatistics(ToolContext& context, const std::string& prefix,
                     std::optional<std::int32_t> day);
 

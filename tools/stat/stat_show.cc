@@ -31,7 +31,7 @@ struct DistributionDay {
   Summary summary;
 };
 
-// Everything that is shown of a key. One key may be a scalar and a distribution.
+// What is shown of a key, which may be a scalar and a distribution at once.
 struct Statistic {
   std::string key;
   std::vector<ScalarDay> scalarDays;
@@ -61,7 +61,7 @@ Status forEachValue(SqliteHistory& history, const std::string& key, Days days,
 Expected<Statistic> readStatistic(SqliteHistory& history, const std::string& key, Days days) {
   Statistic statistic;
   statistic.key = key;
-  // Values are read several times; all of them the same ones.
+  // The values are read several times and must not change in between.
   if (Status begun = history.beginSnapshot(); !begun) return begun.error();
   Status read =
       history.walkScalar(key, days.first, days.last,

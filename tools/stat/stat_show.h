@@ -1,4 +1,4 @@
-// One statistic over the days that are held.
+// One statistic over the days in the store.
 #pragma once
 
 #include <cstdint>
@@ -9,8 +9,8 @@
 
 namespace tavrel {
 
-/// Prints a scalar day by day, and of a distribution a summary, percentiles, a histogram and a line
-/// for each day: of the last `days` days, today included, or of all.
+/// Prints a scalar day by day, or a distribution's summary, percentiles, histogram and a line for
+/// each day. Covers the last `days` days, today included, or all.
 void showStatistic(ToolContext& context, const std::string& key, std::optional<std::uint32_t> days);
 
 }  // namespace tavrel

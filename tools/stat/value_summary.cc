@@ -14,7 +14,7 @@ constexpr std::size_t kDigits = std::size_t{1} << kBitsPerPass;
 constexpr std::uint64_t kSign = std::uint64_t{1} << 63;
 constexpr double kMostBuckets = 11;
 
-// Bits that are in the order of the values that they stand for, and back.
+// Maps values to bits of the same order, and back.
 std::uint64_t orderedBits(double value) {
   const auto bits = std::bit_cast<std::uint64_t>(value);
   return bits & kSign ? ~bits : bits | kSign;
@@ -23,7 +23,7 @@ double valueOf(std::uint64_t ordered) {
   return std::bit_cast<double>(ordered & kSign ? ordered & ~kSign : ~ordered);
 }
 
-// The least of 1, 2 and 5 times a power of ten that is not below `width`.
+// The smallest number not below `width` that is 1, 2 or 5 times a power of ten.
 double roundedUp(double width) {
   const double power = std::pow(10, std::floor(std::log10(width)));
   for (const double factor : {1.0, 2.0, 5.0}) {
@@ -32,7 +32,7 @@ double roundedUp(double width) {
   return 10 * power;
 }
 
-// Enough digits to tell bounds apart, few enough to hide what multiplication adds to 0.3.
+// Enough digits to distinguish bounds, few enough to hide rounding errors.
 std::string boundText(double bound) {
   return format("%.15g", bound);
 }
@@ -58,7 +58,7 @@ void Summary::add(double value) {
 }
 
 double Summary::mean() const {
-  // The sum of the extremes is infinite as the mean is, or not a number.
+  // Like the mean, the sum of the extremes is infinite or not a number.
   return finite_ == numbers_ ? mean_ : minimum_ + maximum_;
 }
 
@@ -124,7 +124,7 @@ RoundHistogram::RoundHistogram(const Summary& summary)
     : lowest_(summary.lowest()), highest_(summary.highest()) {
   if (!summary.hasFinite()) return;
   double buckets = 1;
-  // Divided first, as the difference may be beyond a double.
+  // Divides first, because the difference may exceed a double.
   const double narrowest = highest_ / kMostBuckets - lowest_ / kMostBuckets;
   if (std::isnormal(narrowest)) {
     width_ = roundedUp(narrowest);

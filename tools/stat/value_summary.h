@@ -1,12 +1,14 @@
-// What many values come to, without keeping them.
+// Figures that sum up many values without keeping them.
 //
 //   Summary summary;
 //   forEachValue([&](double value) { summary.add(value); });
 //   PercentileSearch search(summary.numbers(), kPercents);
-//   while (search.needsPass()) { forEachValue([&](double v) { search.add(v); }); search.endPass();
+//   while (search.needsPass()) {
+//     forEachValue([&](double v) { search.add(v); });
+//     search.endPass();
 //   }
 //
-// Values that are no numbers are counted and otherwise passed over.
+// Values that are not numbers are counted and otherwise skipped.
 #pragma once
 
 #include <array>
@@ -26,17 +28,17 @@ class Summary {
 
   /// All values.
   std::int64_t count() const { return numbers_ + notNumbers_; }
-  /// Those that are numbers, infinities included. Without any, nothing else is known.
+  /// Those that are numbers, infinities included. Without any, the other figures are undefined.
   std::int64_t numbers() const { return numbers_; }
   std::int64_t notNumbers() const { return notNumbers_; }
   double minimum() const { return minimum_; }
   double maximum() const { return maximum_; }
-  /// Infinite when a value is; not a number when values of both infinities are there.
+  /// Infinite when a value is; not a number when both infinities occur.
   double mean() const;
   /// The root of the mean squared deviation; not a number when a value is infinite.
   double standardDeviation() const;
 
-  /// Of the values that are finite. Without any, nothing else is known.
+  /// Of the finite values. Without any, the other figures are undefined.
   bool hasFinite() const { return finite_ > 0; }
   double lowest() const { return lowest_; }
   double highest() const { return highest_; }

@@ -16,18 +16,18 @@
  * at most 4 MiB. Now and then, when a page fills up or a day begins, a call makes a system call.
  *
  * Guarantees.
- *  - No call fails towards the program, waits for another thread or process, allocates from the
- *    heap, changes errno or raises a signal. Where nothing can be recorded the calls do nothing;
+ *  - No call reports a failure, waits for another thread or process, allocates from the heap,
+ *    changes errno or raises a signal. Where recording is impossible the calls do nothing;
  *    BHClientGetStatus says why.
  *  - Every call but the two look-ups may be made in a signal handler, and all of them from any
  *    thread. Handles live as long as the process and stay valid in children.
  *  - What was recorded before the process ended, however it ended, is folded exactly once. A power
- *    cut loses what was recorded since the last fold (hourly by default).
+ *    cut loses what was recorded since the last fold.
  *  - A value belongs to the UTC day that the clock showed (CLOCK_REALTIME_COARSE, which lags by
  *    some milliseconds). While the clock is older than this library, as on a device that has just
  *    started without a battery clock, values are dated once it has been set.
- *  - A set supersedes what this process added or set earlier that day; of two processes the later
- *    set counts.
+ *  - A set replaces what this process added or set earlier that day; of sets by two processes the
+ *    later one counts.
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
@@ -51,14 +51,14 @@ extern "C" {
 typedef struct BHClientScalarKey BHClientScalarKey;
 typedef struct BHClientDistributionKey BHClientDistributionKey;
 
-/* Looks a key up; the same name gives the same handle. The name is copied. Never NULL: a key that
- * is NULL, empty, longer than 1024 bytes, has control characters or is one too many (4096 per
- * process) gets a handle whose
- * values are dropped. The other calls accept NULL, and drop the value. */
+/* Looks a key up; the same name gives the same handle. The name is copied. Never returns NULL: a
+ * key that is NULL, empty, longer than 1024 bytes, has control characters or is one too many (4096
+ * per process) gets a handle whose values are dropped. The other calls accept NULL, and drop the
+ * value. */
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 
-/* Adds to today's value, which is 0 before. Sums wrap in two's complement. */
+/* Adds to today's value, which starts at 0. Sums wrap in two's complement. */
 BH_CLIENT_PUBLIC void BHClientScalarAdd(BHClientScalarKey* key, int64_t amount);
 /* Replaces today's value. */
 BH_CLIENT_PUBLIC void BHClientScalarSet(BHClientScalarKey* key, int64_t value);
@@ -95,8 +95,8 @@ typedef enum BHClientStatus {
   BHClientStatusKeyRefused = 9   /* values are kept, but a look-up was refused */
 } BHClientStatus;
 
-/* Says whether values recorded now are kept, and why not. Starts recording if need be. `text`, if
- * not NULL, receives a sentence that lives as long as the process. */
+/* Says whether values recorded now are kept, and if not, why. Starts recording if necessary.
+ * `text`, if not NULL, receives a sentence that lives as long as the process. */
 BH_CLIENT_PUBLIC BHClientStatus BHClientGetStatus(const char** text);
 
 #ifdef __cplusplus

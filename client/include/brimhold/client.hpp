@@ -1,4 +1,4 @@
-// The C++20 face of brimhold/client.h, which says what is guaranteed and what it costs.
+// The C++20 interface of brimhold/client.h, which describes guarantees and costs.
 //
 //   #include <brimhold/client.hpp>
 //   static const brimhold::Scalar starts("com.example.starts");
@@ -54,7 +54,7 @@ class ScopedTimer {
   BHClientTimer timer_ = BHClientTimerStart();
 };
 
-/// Why nothing is recorded, as a sentence; empty while values are kept.
+/// Why values are not kept, as a sentence; empty while they are.
 inline std::string_view whyNotRecording() noexcept {
   const char* text = nullptr;
   return BHClientGetStatus(&text) == BHClientStatusRecording ? std::string_view() : text;

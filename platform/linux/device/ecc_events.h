@@ -8,7 +8,7 @@
 //
 // An event is removed once `filed` says that its record is safe, an error with its read. A run of
 // reads ends with the first that fails. It gives ten events at most, and none after one that was
-// not filed: the read that follows fails with EBUSY and removes nothing. The folder is locked from
+// not filed: the next read fails with EBUSY and removes nothing. The folder is locked from
 // a run's first event to its end, so that no other process hands out the same ones.
 //
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
@@ -36,7 +36,7 @@ namespace tavrel {
 
 inline constexpr std::size_t kEccEventBytes = 72;
 
-/// The most events that one run of reads is given.
+/// The most events in one run of reads.
 inline constexpr int kEccEventsOfARun = 10;
 
 class EccEvents {
@@ -83,7 +83,7 @@ class EccEvents {
   std::vector<Event> queue_;  // the next one last; empty: look again
   bool hasLooked_ = false;
   int handedOut_ = 0;      // in this run
-  std::string unfiled_;    // the file of the event that was handed out last; empty: it was filed
+  std::string unfiled_;    // the file of the event handed out last; empty once that is filed
   Descriptor folderLock_;  // held during a run
 };
 

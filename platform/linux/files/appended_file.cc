@@ -10,11 +10,11 @@
 namespace tavrel {
 namespace {
 
-/// How far the whole lines of a file reach: -1 with `errno` when it cannot be read. Behind them
-/// stand at most zero bytes, line ends and a line that has no end.
+/// How far the whole lines of a file reach; -1 with `errno` when it cannot be read. Only zero
+/// bytes, line ends and a line without an end may follow them.
 off_t endOfWholeLines(int descriptor, off_t size) {
   std::array<char, 4096> block;
-  off_t lineEnd = 0;  // the end of the line that is being looked at; 0: it has none
+  off_t lineEnd = 0;  // the end of the current line; 0 when it has none
   for (off_t end = size; end > 0;) {
     const off_t begin = std::max<off_t>(end - static_cast<off_t>(block.size()), 0);
     const auto length = static_cast<std::size_t>(end - begin);

@@ -66,8 +66,8 @@ class NewFile {
 /// appends in the same way waits; reading goes on.
 class AppendedFile {
  public:
-  /// Appends lines in one write, which survives the end of the process but not of the power. When
-  /// they do not fit, nothing of them is left. Nothing is appended beyond `largest` bytes.
+  /// Appends lines in one write, which survives the end of the process but not a power cut. Lines
+  /// that do not fit leave nothing behind. The file never grows beyond `largest` bytes.
   Status append(ByteSpan lines, std::size_t largest);
   /// Writes what was appended, and the file's name, through to storage.
   Status flush();
@@ -77,14 +77,14 @@ class AppendedFile {
   AppendedFile(FileSystem& fileSystem, std::string path, Descriptor descriptor)
       : fileSystem_(&fileSystem), path_(std::move(path)), descriptor_(std::move(descriptor)) {}
   Status cutTornEnd(std::int64_t size);
-  /// Cuts off what stands behind the whole lines.
+  /// Cuts off what follows the whole lines.
   Status mend();
 
   FileSystem* fileSystem_;
   std::string path_;
   Descriptor descriptor_;
   std::uint64_t size_ = 0;  // of the whole lines
-  bool isTorn_ = false;     // something stands behind them
+  bool isTorn_ = false;     // something follows them
   bool isFlushed_ = false;
   bool isNameFlushed_ = false;
 };
@@ -106,12 +106,12 @@ class FileSystem {
   /// process left in the folder are removed once they are older than
   /// `limits::kTemporaryFileSeconds`.
   Expected<NewFile> create(const std::string& path, mode_t mode);
-  /// A file that exists keeps its owner, and its mode but for what `mode` withholds from others.
+  /// An existing file keeps its owner and its mode, except for permissions that `mode` withholds.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Opens a file to append to it; it and its folder are made when missing. What a kill or a power
-  /// cut left behind its last whole line is cut off: a line without an end, and lines of zero
-  /// bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
+  /// Opens a file to append to it; makes it and its folder when missing. Cuts off what a kill or a
+  /// power cut left after its last whole line: a line without an end, and lines of zero bytes.
+  /// Waits for another process at most `limits::kFileLockMilliseconds`.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.

@@ -3,10 +3,10 @@
 // Structured records are lines of JSON in
 // /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
 // and day. Each is with the kernel when its call returns; they are written through to storage
-// together, at the clean-up that ends a day's work or with the process; that of an ECC event at
-// once, since the event then leaves its queue. Until then their files are locked. The support log
-// of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is rolled to support.log.1
-// and on to support.log.5.
+// together, at the clean-up that ends a day's work or with the process; the record of an ECC event
+// at once, since the event then leaves its queue. Until then their files are locked. The support
+// log of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is rolled to
+// support.log.1 and on to support.log.5.
 #pragma once
 
 #include <cstdint>

@@ -188,7 +188,7 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::files(Place plac
   return logs;
 }
 
-// Without the list of names, which takes several times as long to make as to read.
+// Without a list of names, which takes several times as long to make as to read.
 Expected<std::size_t> FileSubmission::count(Place place) const {
   const std::string path = folder(place);
   const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir(path.c_str()), closedir);

@@ -1,6 +1,6 @@
 // Files of submitted logs: "<name>-<stamp>-<unique>", followed by ".log" or ".metadata.plist".
 //
-// A log's name and the second in which it was filed can so be told without its metadata.
+// So a log's name and the second in which it was filed are known without its metadata.
 #pragma once
 
 #include <cstdint>
@@ -19,7 +19,7 @@ std::string plainLogName(std::string_view logName);
 std::string newLogFileName(std::string_view logName, plist::Date now);
 
 struct LogFileName {
-  /// As `plainLogName` gives it.
+  /// In the form that `plainLogName` gives.
   std::string_view logName;
   std::int64_t seconds;  // since 1970, UTC
 

@@ -29,7 +29,7 @@ void SegmentFile::read(std::uint64_t offset, MutableByteSpan into) const {
     into = into.subspan(static_cast<std::size_t>(got));
   }
   std::fill(into.begin(), into.end(), std::byte{0});
-  // What is read next was written no earlier.
+  // What is read next was not written earlier.
   std::atomic_thread_fence(std::memory_order_acquire);
 }
 

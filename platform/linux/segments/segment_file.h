@@ -1,4 +1,4 @@
-// The parts of a segment's file that are read as they stand: bytes, header and names of keys.
+// The parts of a segment's file that are read without interpretation: bytes, header, names of keys.
 #pragma once
 
 #include <array>
@@ -12,7 +12,7 @@
 
 namespace tavrel {
 
-/// What the header says about the process that made the segment. Claims, like all of a segment.
+/// What the header claims about the process that made the segment. It may be false.
 struct SegmentFacts {
   std::array<std::byte, 16> identity{};
   std::array<std::byte, 16> boot{};
@@ -21,7 +21,7 @@ struct SegmentFacts {
   std::uint32_t pid = 0;
 };
 
-/// Bytes that end early, as of a file that was truncated, read as zero.
+/// Bytes beyond the end, for example of a truncated file, read as zero.
 class SegmentFile {
  public:
   /// Borrows the descriptor.
@@ -33,7 +33,7 @@ class SegmentFile {
 
   SegmentFacts facts() const;
 
-  /// The name of the key of this number, nothing when it has none of this kind that is valid.
+  /// The name of the key with this number; nothing when there is no valid one of this kind.
   std::optional<std::string_view> key(std::uint32_t number, std::uint8_t kind);
 
  private:

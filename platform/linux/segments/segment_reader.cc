@@ -16,7 +16,7 @@
 namespace tavrel {
 namespace {
 
-// How often a cell is looked at that is set while it is read, before it is left for later.
+// How often to look at a cell that is being set, before it is left for later.
 constexpr int kCellAttempts = 8;
 
 std::int64_t saturatingAdd(std::int64_t a, std::int64_t b) {
@@ -164,7 +164,7 @@ void SegmentReader::readCells(Reading& reading) {
   }
 }
 
-// Three looks: at the state, at the value, and whether the state was the same meanwhile.
+// Three looks: at the state, at the value, and whether the state is still the same.
 void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   const std::uint64_t offset = kBHCells + std::uint64_t{index} * std::uint64_t{kBHCellBytes};
   SegmentPosition::Cell& folded = reading.position.cells[index];
@@ -215,7 +215,7 @@ void SegmentReader::readChunk(Reading& reading, std::uint32_t index) {
       folded.generation == generation ? folded : SegmentPosition::Chunk{generation, 0};
   std::uint32_t end = std::min<std::uint32_t>(from.folded, kBHChunkRecords);
   if (end < kBHChunkRecords) {
-    // First which records are there, then what they hold.
+    // First which records exist, then their content.
     const std::uint64_t first = kBHChunkFirst + std::uint64_t{end} * std::uint64_t{kBHRecordBytes};
     std::array<std::byte, kBHChunkBytes> bytes;
     const MutableByteSpan rest = MutableByteSpan(bytes).subspan(first);
@@ -239,7 +239,7 @@ void SegmentReader::readChunk(Reading& reading, std::uint32_t index) {
     }
     for (; end < ready; ++end) {
       const std::uint64_t mark = markAt(end);
-      // Only a hostile writer takes a mark back or the date from it.
+      // Only a hostile writer withdraws a mark, or its date.
       if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
       const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
       const auto key = file_.key(mark & 0xffff, kBHKindDistribution);

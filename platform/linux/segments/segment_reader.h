@@ -6,12 +6,11 @@
 //   if (state && *state == SegmentReader::State::Begun)
 //     progress = reader.read(position, dating, writerIsGone, sink);   // moves `position`
 //   ... the store takes the values and `position` in one transaction ...
-//   acknowledge(writableDescriptor, progress);                        // the process may go on
-//   there
+//   acknowledge(writableDescriptor, progress);  // the process may use that space again
 //
 // Whatever the bytes are, a read takes bounded time and memory (some 5 MB), yields values only of
-// valid keys, and leaves a position from which the next read goes on. A file that changes while it
-// is read yields less now and the rest later.
+// valid keys, and leaves a position from which the next read continues. A file that changes while
+// it is read yields less now and the rest later.
 #pragma once
 
 #include <cstdint>
@@ -29,9 +28,9 @@ namespace tavrel {
 struct SegmentScalar {
   std::string_view key;  // valid during the call
   std::int32_t day;      // UTC, days since 1970-01-01
-  bool isSet;            // replaces the value; else is added to it
+  bool isSet;            // replaces the value; otherwise it is added
   std::int64_t value;
-  /// UTC of a set, in nanoseconds since 1970: of two processes the later set counts. Saturated.
+  /// UTC of a set, in nanoseconds since 1970, saturated: of sets by two processes the later counts.
   std::int64_t setTime;
 };
 
@@ -50,14 +49,14 @@ class SegmentSink {
   virtual void takeRecord(const SegmentRecord& record) = 0;
 };
 
-/// The UTC instant of the boot in seconds since 1970, nothing while the clock is not credible: then
-/// values without a date wait.
+/// The UTC instant of the boot in seconds since 1970; nothing while the clock is not credible, and
+/// values without a date then wait.
 using BootInstant = std::optional<std::int64_t>;
 
-/// The same by this machine's clocks. A clock that shows a day before that of the build is wrong.
+/// The same by this machine's clocks. A clock that shows a day before the build is wrong.
 BootInstant currentBootInstant();
 
-/// What a read did beside yielding values.
+/// What a read did besides yielding values.
 struct SegmentProgress {
   struct Acknowledgement {
     std::uint64_t offset;
@@ -67,25 +66,25 @@ struct SegmentProgress {
   std::uint64_t nextFolds = 0;
   std::uint64_t dropped = 0;  // values that the program lost since the position
   std::uint64_t refused = 0;  // values of invalid keys or days, skipped for good
-  bool isComplete = true;     // nothing was left for later, for lack of a date or of quiet
+  bool isComplete = true;     // nothing was left for later without a date or while it changed
 };
 
 class SegmentReader {
  public:
   enum class State : std::uint8_t {
     Begun,
-    Empty,  // its process has not written the header yet, or died before
+    Empty,  // its process has not written the header yet, or died before it could
   };
 
   /// Borrows a descriptor that can be read.
   explicit SegmentReader(int descriptor) : file_(descriptor), descriptor_(descriptor) {}
 
-  /// An error for what is no segment of this version: foreign type, size, magic.
+  /// An error for a file that is not a segment of this version: foreign type, size or magic.
   Expected<State> state() const;
   SegmentFacts facts() const { return file_.facts(); }
 
-  /// Yields what came after `position`, and moves that. `writerIsGone` as it was known before the
-  /// call (see `segment_writer.h`): then records after one that was never finished are read too.
+  /// Yields what came after `position`, and advances it. `writerIsGone` says what was known before
+  /// the call (see `segment_writer.h`): if true, records after an unfinished one are read too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                        SegmentSink& sink);
 
@@ -100,8 +99,8 @@ class SegmentReader {
   int descriptor_;
 };
 
-/// Tells the process that it may use again what `progress` passed. Call it once the values and the
-/// position are durable. A failure is harmless: the next fold says so again.
+/// Lets the process reuse the space that `progress` passed. Call it once the values and the
+/// position are durable. A failure is harmless: the next fold repeats it.
 Status acknowledge(int writableDescriptor, const SegmentProgress& progress);
 
 }  // namespace tavrel

@@ -55,8 +55,8 @@ SegmentWriter findSegmentProcess(const SegmentFacts& facts) {
 }
 
 SegmentWriter findSegmentWriter(int descriptor, const SegmentFacts& facts) {
-  // Whoever opens the file to write while the lease stands makes the kernel send this signal, which
-  // is ignored unless handled, in the place of SIGIO, which ends the process.
+  // When somebody opens the file for writing during the lease, the kernel sends this signal, which
+  // is ignored unless handled, instead of SIGIO, which ends the process.
   if (fcntl(descriptor, F_SETSIG, SIGURG) == 0) {
     if (fcntl(descriptor, F_SETLEASE, F_RDLCK) == 0) {
       fcntl(descriptor, F_SETLEASE, F_UNLCK);

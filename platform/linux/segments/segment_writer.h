@@ -6,17 +6,17 @@
 namespace tavrel {
 
 enum class SegmentWriter : unsigned char {
-  Gone,     // and none can come: a segment is only opened to write by whoever makes it
-  Present,  // or a descriptor of this process is open to write
+  Gone,     // for good: only the process that creates a segment opens it for writing
+  Present,  // or this process has a descriptor open for writing
   Unknown,  // leave the segment
 };
 
-/// Asks the kernel for a lease, which it refuses while anybody has the file open or mapped to
-/// write; needs the file's owner or CAP_LEASE, and a descriptor that can only be read. Where there
-/// are no leases the process that `facts` names is looked for.
+/// Asks the kernel for a lease, which it refuses while any process has the file open or mapped for
+/// writing. Needs the file's owner or CAP_LEASE, and a read-only descriptor. Where leases do not
+/// work, looks for the process that `facts` names.
 SegmentWriter findSegmentWriter(int readOnlyDescriptor, const SegmentFacts& facts);
 
-/// The second way alone.
+/// Only looks for the process.
 SegmentWriter findSegmentProcess(const SegmentFacts& facts);
 
 }  // namespace tavrel

@@ -1,8 +1,9 @@
-// Scalars that could not be committed, in a file beside the store until a commit takes them in.
+// A file beside the store that keeps scalars that could not be committed, until a commit takes
+// them.
 //
 // A batch that begins to write takes the file's values in first, and removes the file once they are
 // committed. In the same transaction the store remembers, as its application id, which values it
-// has taken in: those of a file that a killed process did not come to remove are not taken in
+// has taken in, so that those of a file that a killed process could not remove are not taken in
 // twice.
 #pragma once
 
@@ -23,7 +24,7 @@ struct KeptValue {
   std::string key;
 };
 
-/// Those who change the file take turns by the lock on the store's folder.
+/// Processes that change the file take turns through the lock on the store's folder.
 class KeptValues {
  public:
   explicit KeptValues(const std::string& storePath) : path_(storePath + "-kept") {}
@@ -31,9 +32,8 @@ class KeptValues {
   bool exist() const { return FileSystem::status(path_).has_value(); }
   /// In the order in which they were kept; none when there is no file.
   Expected<std::vector<KeptValue>> read();
-  /// Adds values, whose numbers are given here, to those of the file, durably. Of more than
-  /// `limits::kKeptValueBytes` the earliest are dropped; yields how many. A damaged file is
-  /// replaced.
+  /// Adds values durably to those of the file, and gives them their numbers. Drops the earliest
+  /// beyond `limits::kKeptValueBytes` and yields how many. Replaces a damaged file.
   Expected<std::size_t> add(std::vector<KeptValue> values);
   void remove() { files_.discard(path_); }
 

@@ -14,7 +14,7 @@ namespace {
 // their keys: the more there are, the fewer pages and chunks are written twice.
 constexpr std::size_t kPendingBytes = 8U << 20;
 
-// The memory of a waiting distribution besides its records.
+// The memory of a waiting distribution, without its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
 
 constexpr std::int64_t kValuesPerSeries = std::int64_t{kValuesPerChunk} << kChunkOrdinalBits;
@@ -89,8 +89,8 @@ void SqliteBatch::takeKeptValues() {
   connection_.execute(("PRAGMA application_id = " + number).c_str());
 }
 
-// What others have kept meanwhile stays, and so does the file when its turn does not come: the next
-// batch knows by the number what it has to take in.
+// Values that others have kept in the meantime stay, and so does the file when it cannot be removed
+// now: the number tells the next batch which values to take in.
 void SqliteBatch::removeTakenValues() {
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);

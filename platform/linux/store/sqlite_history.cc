@@ -92,8 +92,8 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
   std::optional<StoreFailure> failure_;
 };
 
-// Runs `next`, one of store_sql::kNext..., through the days that hold `key`, and calls `handle`
-// while a row of it stands there.
+// Runs `next`, one of store_sql::kNext..., through the days that hold `key`, and calls `handle` for
+// each of its rows.
 template <class Handle>
 void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDay,
                std::int32_t lastDay, Handle handle) {
@@ -106,7 +106,7 @@ void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDa
     const std::string_view found = next.bytes(0);
     day = next.integer(1);
     if (found == key) handle(stop);
-    // A lower key comes first in a later day, which may still have this one.
+    // A later day that begins with a lower key may still have this one.
     if (found >= key) ++day;
     next.reset();
   }
@@ -188,7 +188,7 @@ void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
   }
 }
 
-// What is read without locks is good only when nobody has written meanwhile.
+// What was read without locks is valid only if nobody has written in the meantime.
 void SqliteHistory::checkUnchanged() const {
   if (!store_->lockless || FileVersion::of(site_.path) == store_->lockless) return;
   throw StoreFailure{StoreFault::Busy, "was written while it was read: run the command again"};
@@ -269,7 +269,7 @@ Status SqliteHistory::walkDistribution(std::string_view key, std::int32_t firstD
 Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
   std::optional<DaySpan> span;
   const Status read = attempt([&] {
-    // Of each table one look-up at either end.
+    // One look-up at either end of each table.
     for (const char* table : {"scalars", "distributions"}) {
       for (const char* end : {"min", "max"}) {
         SqliteStatement statement(store_->connection,

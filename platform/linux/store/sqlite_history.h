@@ -49,7 +49,7 @@ class SqliteHistory : public BHHistory {
   Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                            const CountedRowHandler& rowHandler);
 
-  /// The rows of one key by day, in the same way. Costs one look-up for each day held.
+  /// The rows of one key by day, in the same way. Costs one look-up for each day in the store.
   Status walkScalar(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
                     const ScalarRowHandler& rowHandler);
   Status walkDistribution(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
@@ -59,7 +59,7 @@ class SqliteHistory : public BHHistory {
     std::int32_t first = 0;
     std::int32_t last = 0;
   };
-  /// From the first to the last day of which anything is held; nothing when the store is empty.
+  /// The first and the last day in the store; nothing when the store is empty.
   Expected<std::optional<DaySpan>> daysHeld();
 
   /// From here on all queries see the store as it is at the first of them.

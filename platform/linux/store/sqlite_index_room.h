@@ -1,9 +1,9 @@
 // Room for the index of SQLite's write-ahead log.
 //
-// SQLite maps the index, the "-shm" file, and stores into it. It makes the file longer by one byte
-// a page of 4 KiB, which on a file system with smaller blocks leaves holes: on a full disk a store
-// into one raises SIGBUS. An `IndexRoom` has every page of the index allocated before SQLite sees
-// it. Too little room is then SQLITE_FULL, for writers and for readers alike.
+// SQLite maps the index, the "-shm" file, and writes into the mapping. It extends the file by
+// writing one byte per page of 4 KiB, which leaves holes on a file system with smaller blocks. On a
+// full disk, a write into a hole raises SIGBUS. An `IndexRoom` has every page of the index
+// allocated before SQLite sees it. Without enough room, writers and readers then get SQLITE_FULL.
 #pragma once
 
 #include <sqlite3.h>
@@ -12,14 +12,15 @@ namespace tavrel {
 
 class IndexRoom {
  public:
-  /// Stands between the connection, which has run no statement yet, and its file. Must outlive it.
+  /// Intercepts the calls of the connection, which must not have run a statement yet, on its file.
+  /// Must outlive the connection.
   explicit IndexRoom(sqlite3* connection);
   IndexRoom(const IndexRoom&) = delete;
   IndexRoom& operator=(const IndexRoom&) = delete;
 
  private:
-  // What SQLite calls instead of the file's own methods. It comes first: the address that SQLite
-  // has of it leads back to the rest.
+  // SQLite calls this instead of the file's own methods. It is the first member: the address that
+  // SQLite has leads back to the other members.
   struct Methods {
     sqlite3_io_methods replaced;
     const sqlite3_io_methods* own;

@@ -8,7 +8,7 @@
 namespace tavrel {
 namespace {
 
-// The name that a linked program would have: its interface is the one of the header.
+// The name that a linked program would load. It has the interface of the header.
 constexpr const char* kFile = "libsqlite3.so.0";
 
 [[noreturn]] void refuse() {
@@ -26,7 +26,7 @@ void find(void* library, const char* name, Function& function) {
 }
 
 SqliteLibrary load() {
-  // Never unloaded: what is found in it holds until the process ends.
+  // Never unloaded: the functions found in it are used until the process ends.
   void* const library = dlopen(kFile, RTLD_NOW | RTLD_LOCAL);
   if (!library) refuse();
   SqliteLibrary functions{};

@@ -97,8 +97,8 @@ bool isReadable(SqliteConnection& connection) {
 
 SqliteConnection openStoreForWriting(const std::string& path,
                                      const std::shared_ptr<BusyBudget>& busy) {
-  // SQLite gives its log files the mode of the store, and would make that for everybody to read.
-  // A store that is there is not opened for this: closing it would give up SQLite's locks.
+  // SQLite gives its log files the mode of the store, and would create a store that all can read.
+  // An existing store is not opened for this: closing it would give up SQLite's locks.
   if (!checkIsFile(path)) {
     const Descriptor made(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0640));
   }
@@ -129,7 +129,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
                                                  const std::shared_ptr<BusyBudget>& busy,
                                                  bool leavesNoTrace) {
   if (!checkIsFile(path)) return std::nullopt;
-  // Taken before the log is looked at: what a writer moves from its log into the file from here on
+  // Taken before looking at the log: whatever a writer moves from the log into the file after this
   // changes the version.
   const auto version = FileVersion::of(path);
   const auto openLockless = [&]() -> std::optional<ReadableStore> {
@@ -143,7 +143,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
     if (!isReadable(connection)) return std::nullopt;
     return ReadableStore{std::move(connection), std::nullopt};
   } catch (const StoreFailure& failure) {
-    // Using the log takes files in the store's folder, and room for them.
+    // Using the log needs files in the store's folder, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
     if (hasLog(path)) {
       if (failure.fault == StoreFault::Device) throw;
@@ -153,7 +153,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
                              "written: have a user who may write run 'tavrelctl stat list' once"};
     }
   }
-  // Without a log all there is stands in the file itself.
+  // Without a log, everything is in the file itself.
   return openLockless();
 }
 

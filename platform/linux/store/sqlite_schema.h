@@ -65,13 +65,13 @@ SqliteConnection openStoreForWriting(const std::string& path,
 
 struct ReadableStore {
   SqliteConnection connection;
-  /// Set when the file is read without locks and without a log: the file as it was before. What was
-  /// read is good as long as this has not changed.
+  /// The file as it was before a read without locks and without a log; otherwise nothing. What was
+  /// read is valid if this has not changed.
   std::optional<FileVersion> lockless;
 };
 
-/// Opens the store for reading; nothing when there is none yet. `leavesNoTrace`: where the log
-/// holds nothing, the file is read without locks, so that no log files are made beside it.
+/// Opens the store for reading; nothing when there is none yet. With `leavesNoTrace`, a file whose
+/// log is empty is read without locks, so that no log files appear beside it.
 std::optional<ReadableStore> openStoreForReading(const std::string& path,
                                                  const std::shared_ptr<BusyBudget>& busy,
                                                  bool leavesNoTrace = false);

@@ -26,15 +26,15 @@ struct FileIdentity {
   static std::optional<FileIdentity> of(const std::string& path);
 };
 
-/// Takes the store and its log files from all users but their owner and group, as far as they are
-/// there and belong to this user.
+/// Removes the permissions of other users from the store and its log files, if they exist and
+/// belong to this user.
 void withholdFromOthers(const std::string& path);
 
-/// Which file stands at a path, and as of when.
+/// Which file is at a path, and when it last changed.
 struct FileVersion {
   FileIdentity identity;
   std::int64_t bytes = 0;
-  std::int64_t seconds = 0;  // of its last change, and nanoseconds
+  std::int64_t seconds = 0;  // of its last change, with nanoseconds
   std::int64_t nanoseconds = 0;
   bool operator==(const FileVersion&) const = default;
 

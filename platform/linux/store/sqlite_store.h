@@ -8,8 +8,8 @@
 //   store.BHClientSetValueForScalarKey("com.example.starts", 3);
 //   store.commit();
 //
-// Failures are told to the system log in one line each. Values that cannot be committed are kept in
-// a file beside the store for the next commit, or, where that fails too, in memory.
+// Each failure is one line in the system log. Values that cannot be committed are kept in
+// a file beside the store for the next commit or, when that fails too, in memory.
 #pragma once
 
 #include <cstdint>
@@ -64,7 +64,7 @@ class SqliteStore : public StatisticsStore {
 
  private:
   SqliteConnection openForWriting();
-  /// Keeps the values that a failure did not let be committed. False when they could not be kept.
+  /// Keeps the values that a failure has left uncommitted. False when they could not be kept.
   bool keep(const StoreFailure& failure);
   void checkpoint();
   std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);

@@ -1,6 +1,5 @@
 // The standard streams of the process. Under the journal a text on standard error becomes an entry
-// at debug level: it tells who works on tavrel how a run went, and would be taken for trouble
-// otherwise.
+// at debug level: it shows developers how a run went, and would otherwise look like trouble.
 #pragma once
 
 #include "platform/linux/system_log/linux_system_log.h"

@@ -83,7 +83,7 @@ void appendPrintable(std::string& out, std::string_view text) {
   }
 }
 
-/// The last place up to `at` where no character is cut apart; `at` where the text is no UTF-8.
+/// The last place up to `at` that does not divide a character; `at` when the text is not UTF-8.
 std::size_t characterBoundary(std::string_view text, std::size_t at) {
   constexpr std::size_t kContinuationBytes = 3;
   for (std::size_t back = 0; back <= kContinuationBytes && back <= at; ++back) {
@@ -185,7 +185,7 @@ bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view message) {
   while (send(journal_.get(), entry.data(), entry.size(), MSG_NOSIGNAL) < 0) {
     if (errno == EINTR) continue;
     if (errno == EMSGSIZE || errno == ENOBUFS) return sendInMemoryFile(journal_.get(), entry);
-    // The journal may have restarted; entries go to the stream meanwhile.
+    // The journal may have restarted; until it is back, entries go to the stream.
     connectToJournal();
     return false;
   }

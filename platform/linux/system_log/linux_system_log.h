@@ -6,7 +6,7 @@
 // written on standard error at once, as "TIME LEVEL message", further lines indented and control
 // characters escaped.
 //
-// A message above debug level that is longer than `kLongestMessage` is cut there, its end saying
+// A message above debug level that is longer than `kLongestMessage` is cut there, says at its end
 // how much is missing, and follows whole at debug level.
 //
 // Every level is written; what to keep and what to show is the journal's business.
@@ -33,7 +33,7 @@ class LinuxSystemLog final : public SystemLog {
   /// Whether standard error is the journal's.
   bool isJournal();
 
-  /// Bytes of a message, without the words about what was cut.
+  /// Bytes of a message, without the note about what was cut.
   static constexpr std::size_t kLongestMessage = 8192;
 
  private:
