@@ -17,9 +17,10 @@ constexpr std::size_t kElementColumns = kElementIndent.size() - 1;
 JsonList::JsonList(std::ostream& out, Json head, std::string_view name, Layout layout)
     : out_(out), layout_(layout) {
   const bool isLine = layout == Layout::Line;
-  std::string text = jsonText(withFormatVersion(std::move(head)), isLine ? -1 : 2);
-  text.resize(text.size() - (isLine ? 1 : 2));  // without the end of the object
-  out_ << text << (isLine ? "," : ",\n  ") << Json(name).dump() << (isLine ? ":[" : ": [");
+  const std::string object = jsonText(withFormatVersion(std::move(head)), isLine ? -1 : 2);
+  const std::string_view open =
+      std::string_view(object).substr(0, object.rfind(isLine ? "}" : "\n}"));
+  out_ << open << (isLine ? "," : ",\n  ") << Json(name).dump() << (isLine ? ":[" : ": [");
 }
 
 void JsonList::add(const Json& element) {
