@@ -9,10 +9,13 @@ target_compile_options(tavrel_options INTERFACE
   -Wcast-align -Wdouble-promotion -Wformat=2 -Wimplicit-fallthrough
   -ffp-contract=off -fno-math-errno)
 
-# With optimisation, GCC 12 wrongly warns of overlapping and overlong copies inside std::string, and of numbers
-# used as pointers where a value is destroyed. The other builds have both warnings.
-target_compile_options(tavrel_options INTERFACE
-  $<$<AND:$<CXX_COMPILER_ID:GNU>,$<CONFIG:Release>>:-Wno-restrict;-Wno-array-bounds;-Wno-stringop-overflow>)
+# With optimisation, GCC 12 wrongly warns of overlapping and overlong copies inside std::string, and
+# of numbers used as pointers where a value is destroyed. The other builds have these warnings.
+if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+  foreach(warning restrict array-bounds stringop-overflow stringop-overread)
+    target_compile_options(tavrel_options INTERFACE $<$<CONFIG:Release>:-Wno-${warning}>)
+  endforeach()
+endif()
 
 if(TAVREL_SANITIZE)
   # With the sanitizers' own code, GCC wrongly warns of uninitialised reads.
