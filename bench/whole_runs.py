@@ -258,7 +258,7 @@ def growth(bin_directory):
         return
     print("\nInstructions of tavrel -f by number of scalars, half of them whitelisted")
     counts = {}
-    for count in (1000, 10_000, 100_000):
+    for count in (1000, 10_000, 50_000):
         device = Device(bin_directory)
         device.tool("stat", "import", "-", text="".join(scalar_lines(count)))
         device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(0, count, 2)])
@@ -270,7 +270,7 @@ def growth(bin_directory):
         collected = next(line for line in output.splitlines() if "Collected" in line)
         counts[count] = int(collected.split(":")[1].replace(",", ""))
         device.close()
-    slope = (counts[100_000] - counts[1000]) / 99_000
+    slope = (counts[50_000] - counts[1000]) / 49_000
     for count, instructions in counts.items():
         straight = counts[1000] + slope * (count - 1000)
         print(f"  {count:>9,} scalars {instructions:15,} instructions, "
