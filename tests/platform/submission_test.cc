@@ -42,6 +42,10 @@ std::ptrdiff_t filesPending(const TemporaryRoot& device) {
 TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
   const TemporaryRoot device;
   device.write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
+  const std::string orphan = "/var/mobile/Library/Logs/Submission/pending/old.metadata.plist";
+  device.write(orphan, "left by a process that was killed");
+  fs::last_write_time(device.root.path(orphan),
+                      fs::file_time_type::clock::now() - std::chrono::hours(25));
   Service service(device.root);
   ASSERT_TRUE(service.file("log-tallied", {{"previous_os_version", "<unknown>"}}));
   service.clock.time = plist::Date::since1970(1'795'802'600);
@@ -54,9 +58,8 @@ TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
   EXPECT_EQ(parseLogFileName(logs[0].name), (LogFileName{"log-tallied", 1'795'802'538}));
   for (const char* other : {"-20261127T180218Z-5f0c9a1e", "a-20261127T180218Z-5f0c9a1",
                             "a-20261327T180218Z-5f0c9a1e", "a-20261127T240218Z-5f0c9a1e",
-                            "a-2026112_T180218Z-5f0c9a1e", "a_20261127T180218Z-5f0c9a1e"}) {
+                            "a-2026112_T180218Z-5f0c9a1e", "a_20261127T180218Z-5f0c9a1e"})
     EXPECT_FALSE(parseLogFileName(other)) << other;
-  }
   EXPECT_EQ(contentOf(logs[0].path), kContent);
   std::string metadata;
   appendJson(metadata, logs[0].metadata);

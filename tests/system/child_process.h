@@ -12,8 +12,7 @@
 
 namespace tavrel {
 
-/// Runs `body` in a forked process that then ends. Its standard error goes to `errorFile`. Yields
-/// the process.
+/// Runs `body` in a forked process with its standard error in `errorFile`; yields the process.
 inline int forkProcess(const std::function<void()>& body,
                        const std::string& errorFile = "/dev/null") {
   const int child = ::fork();
