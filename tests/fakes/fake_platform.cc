@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <functional>
 #include <utility>
 
 namespace tavrel::fakes {
@@ -45,8 +46,7 @@ class FakeSnapshot : public StackSnapshot {
   }
   bool capture() override { return source_.captures; }
   std::optional<ByteSpan> buffer() override {
-    if (!source_.hasBuffer) return std::nullopt;
-    return source_.content;
+    return source_.hasBuffer ? std::optional<ByteSpan>(source_.content) : std::nullopt;
   }
 
  private:
@@ -65,16 +65,13 @@ class FakeLibrary : public DynamicLibrary {
 
   LibraryFunction find(std::string_view function) override {
     if (loader_.missing.contains(function)) return {};
-    Preferences& preferences = loader_.preferences;
     if (function == "ZTXPreferencesGetIntegerValue") {
-      return IntegerPreferenceGetter([&preferences](std::string_view key, std::string_view domain) {
-        return preferences.ZTXPreferencesGetIntegerValue(key, domain);
+      return IntegerPreferenceGetter([preferences = &loader_.preferences](auto key, auto domain) {
+        return preferences->ZTXPreferencesGetIntegerValue(key, domain);
       });
     }
     return PreferenceSetter(
-        [&preferences](std::string_view key, const plist::Value& value, std::string_view domain) {
-          preferences.ZTXPreferencesSetValue(key, value, domain);
-        });
+        std::bind_front(&Preferences::ZTXPreferencesSetValue, &loader_.preferences));
   }
 
  private:

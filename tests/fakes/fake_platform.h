@@ -2,6 +2,7 @@
 // record of what was done to them. Property lists are coded for real.
 #pragma once
 
+#include <algorithm>
 #include <deque>
 #include <exception>
 #include <map>
@@ -53,9 +54,7 @@ struct FakePreferences : Preferences {
   std::map<std::string, plist::Dictionary, std::less<>> domains;
 
   plist::Dictionary& domain(std::string_view name) {
-    auto at = domains.find(name);
-    if (at == domains.end()) at = domains.emplace(name, plist::Dictionary::create()).first;
-    return at->second;
+    return domains.try_emplace(std::string(name), plist::Dictionary::create()).first->second;
   }
   plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view name) override {
     return plist::deepCopy(domain(name).get(key));
@@ -174,8 +173,8 @@ struct FakeAnswers : DeviceAnswers {
 struct FakeDigest : Digest {
   std::array<std::byte, 16> md5(ByteSpan) override {
     std::array<std::byte, 16> digest{};
-    for (std::size_t i = 0; i < digest.size(); ++i)
-      digest[i] = static_cast<std::byte>(i);
+    for (unsigned char i = 0; i < digest.size(); ++i)
+      digest[i] = std::byte{i};
     return digest;
   }
 };
@@ -190,9 +189,8 @@ struct FakeFileReader : FileReader {
     return at->second;
   }
   std::optional<std::int64_t> size(std::string_view path) override {
-    const auto at = contents.find(path);
-    if (at == contents.end()) return std::nullopt;
-    return static_cast<std::int64_t>(at->second.size());
+    const auto content = read(path, SIZE_MAX);
+    return content ? std::optional(static_cast<std::int64_t>(content->size())) : std::nullopt;
   }
 };
 
@@ -225,8 +223,7 @@ struct FakeApplications : PWApplicationWorkspace {
                         const std::function<void(const PWBundleProxy&)>& handler) override {
     ++enumerations;
     if (kind != kInstalledApplications) return;
-    for (const PWBundleProxy& bundle : bundles)
-      handler(bundle);
+    std::ranges::for_each(bundles, handler);
   }
 };
 
@@ -357,30 +354,11 @@ struct FakePlatform {
   FakeSnapshots stackSnapshots;
   FakeStreams streams;
   ProcessState state;
-  Platform platform{.applications = applications,
-                    .clock = clock,
-                    .crashReporting = crashReporting,
-                    .dateFormatting = dateFormatting,
-                    .deviceAnswers = answers,
-                    .digest = digest,
-                    .drivers = drivers,
-                    .dynamicLoader = loader,
-                    .eventLoop = eventLoop,
-                    .files = files,
-                    .locale = locale,
-                    .log = log,
-                    .namedServices = services,
-                    .notifications = notifications,
-                    .preferences = preferences,
-                    .process = process,
-                    .propertyLists = propertyLists,
-                    .stackSnapshots = stackSnapshots,
-                    .standardStreams = streams,
-                    .statistics = store,
-                    .submission = submission,
-                    .systemControls = controls,
-                    .systemVersion = systemVersion,
-                    .state = state};
+  Platform platform{applications, clock,         crashReporting, dateFormatting, answers,
+                    digest,       drivers,       loader,         eventLoop,      files,
+                    locale,       log,           services,       notifications,  preferences,
+                    process,      propertyLists, stackSnapshots, streams,        store,
+                    submission,   controls,      systemVersion,  state};
 
   /// Puts a whitelist in its place.
   void setWhitelist(const plist::Dictionary& groups);

@@ -1,14 +1,12 @@
-#include <sys/stat.h>
 
-#include "base/limits.h"
+#include "device_services.h"
 #include "platform/application_registry.h"
 #include "platform/linux/device/linux_applications.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
 
-class ApplicationsTest : public testing::Test {
+class ApplicationsTest : public testing::Test, protected DeviceServices {
  protected:
   /// Each bundle as "identifier type".
   std::vector<std::string> bundles(std::uint32_t kind = kInstalledApplications) {
@@ -19,35 +17,33 @@ class ApplicationsTest : public testing::Test {
     return found;
   }
   void writeEntry(std::string_view path, std::string_view keys) {
-    device.write(path, "# menu\n[Desktop Entry]\n" + std::string(keys) + "\n");
+    write(path, "# menu\n[Desktop Entry]\n" + std::string(keys) + "\n");
   }
 
-  TemporaryRoot device;
-  KeptLog log;
-  LinuxApplications applications{device.root, log};
+  LinuxApplications applications{root, log};
 };
 
 TEST_F(ApplicationsTest, CountsInstalledPackagesAndThoseOfTheUser) {
-  device.write("/var/lib/dpkg/status",
-               "Package: bash\nEssential: yes\nStatus: install ok installed\nPriority: optional\n"
-               "Architecture: amd64\nDescription: shell\n Status: deinstall ok config-files\n .\n\n"
-               "Package: dpkg\nStatus: install ok installed\nPriority: required\n"
-               "Architecture: amd64\n\n"
-               "Package: half\nStatus: install reinstreq half-installed\nArchitecture: amd64\n\n"
-               "Status: install ok installed\nArchitecture: amd64\n\n\n"
-               "Package: held\nStatus: hold ok installed\nPriority: optional\nArchitecture: all\n\n"
-               "Package: helper\nStatus: install ok installed\nArchitecture: all\n\n"
-               "Package: lib\nStatus: install ok installed\nArchitecture: amd64\n\n"
-               "Package: lib\nStatus: install ok installed\nArchitecture: i386\n\n"
-               "Package: ages\nStatus: install ok installed\nArchitecture: i386\n\n"
-               "Package: long\nNote: " +
-                   std::string(3 * limits::kTextLineBytes, 'x') +
-                   "\nArchitecture: all\nProtected: yes\nStatus: install ok installed");
-  device.write("/var/lib/apt/extended_states",
-               "Package: helper\nArchitecture: amd64\nAuto-Installed: 1\n\n"
-               "Package: lib\nArchitecture: i386\nAuto-Installed: 1\n\n"
-               "Package: ages\nAuto-Installed: 1\n\n"
-               "Package: held\nArchitecture: amd64\nAuto-Installed: 0\n");
+  write("/var/lib/dpkg/status",
+        "Package: bash\nEssential: yes\nStatus: install ok installed\nPriority: optional\n"
+        "Architecture: amd64\nDescription: shell\n Status: deinstall ok config-files\n .\n\n"
+        "Package: dpkg\nStatus: install ok installed\nPriority: required\n"
+        "Architecture: amd64\n\n"
+        "Package: half\nStatus: install reinstreq half-installed\nArchitecture: amd64\n\n"
+        "Status: install ok installed\nArchitecture: amd64\n\n\n"
+        "Package: held\nStatus: hold ok installed\nPriority: optional\nArchitecture: all\n\n"
+        "Package: helper\nStatus: install ok installed\nArchitecture: all\n\n"
+        "Package: lib\nStatus: install ok installed\nArchitecture: amd64\n\n"
+        "Package: lib\nStatus: install ok installed\nArchitecture: i386\n\n"
+        "Package: ages\nStatus: install ok installed\nArchitecture: i386\n\n"
+        "Package: long\nNote: " +
+            std::string(3 * limits::kTextLineBytes, 'x') +
+            "\nArchitecture: all\nProtected: yes\nStatus: install ok installed");
+  write("/var/lib/apt/extended_states",
+        "Package: helper\nArchitecture: amd64\nAuto-Installed: 1\n\n"
+        "Package: lib\nArchitecture: i386\nAuto-Installed: 1\n\n"
+        "Package: ages\nAuto-Installed: 1\n\n"
+        "Package: held\nArchitecture: amd64\nAuto-Installed: 0\n");
   EXPECT_EQ(bundles(),
             (Lines{"bash:amd64 System", "dpkg:amd64 System", "held:all User", "helper:all System",
                    "lib:amd64 User", "lib:i386 System", "ages:i386 System", "long:all System"}));
@@ -56,13 +52,13 @@ TEST_F(ApplicationsTest, CountsInstalledPackagesAndThoseOfTheUser) {
 }
 
 TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
-  device.write("/var/lib/dpkg/status", "Package: gone\nStatus: purge ok not-installed\n");
+  write("/var/lib/dpkg/status", "Package: gone\nStatus: purge ok not-installed\n");
   writeEntry("/usr/share/applications/editor.desktop",
              "Type = Application \nName=E\n[X]\nHidden=true");
   writeEntry("/usr/share/applications/kde/mail.desktop", "Type=Application\nHidden=false");
   writeEntry("/usr/share/applications/quiet.desktop", "Type=Application\nNoDisplay=true");
   writeEntry("/usr/share/applications/removed.desktop", "Type=Application");
-  device.write("/usr/share/applications/bare.desktop", "Type=Application\n");
+  write("/usr/share/applications/bare.desktop", "Type=Application\n");
   writeEntry("/usr/local/share/applications/tool.desktop", "Type=Application\r");
   writeEntry("/home/ann/.local/share/applications/kde-mail.desktop", "Type=Application");
   writeEntry("/home/ann/.local/share/applications/removed.desktop",
@@ -70,9 +66,8 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   writeEntry("/usr/share/applications/huge.desktop",
              "Type=Application\nX=" + std::string(limits::kDesktopEntryBytes, 'x'));
   writeEntry("/elsewhere/share/applications/foreign.desktop", "Type=Application");
-  std::filesystem::create_directory(device.root.path("/home/eve"));
-  std::filesystem::create_directory_symlink(device.root.path("/elsewhere"),
-                                            device.root.path("/home/eve/.local"));
+  std::filesystem::create_directory(root.path("/home/eve"));
+  std::filesystem::create_directory_symlink(root.path("/elsewhere"), root.path("/home/eve/.local"));
   auto found = bundles();
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (Lines{"editor.desktop System", "kde-mail.desktop User", "tool.desktop User"}));
@@ -82,16 +77,15 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
 TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(bundles(), Lines{});
   EXPECT_EQ(log.lines, Lines{});
-  device.write("/var/lib/dpkg/status",
-               "Package: a\nStatus: install ok installed\nArchitecture: all\n");
-  device.write("/var/lib/apt/placeholder", "");
-  const std::string states = device.root.path("/var/lib/apt/extended_states");
+  write("/var/lib/dpkg/status", "Package: a\nStatus: install ok installed\nArchitecture: all\n");
+  write("/var/lib/apt/placeholder", "");
+  const std::string states = root.path("/var/lib/apt/extended_states");
   ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);  // read, it would wait for a writer for ever
   EXPECT_EQ(bundles(), Lines{"a:all User"});
   EXPECT_EQ(log.lines, Lines{"cannot read " + states +
                              ": Invalid argument; packages that were installed "
                              "automatically count as installed by the user"});
-  const std::string packages = device.root.path("/var/lib/dpkg/status");
+  const std::string packages = root.path("/var/lib/dpkg/status");
   std::filesystem::rename(states, packages);
   writeEntry("/usr/share/applications/tool.desktop", "Type=Application");
   EXPECT_EQ(bundles(), Lines{"tool.desktop System"});

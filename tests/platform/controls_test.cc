@@ -1,12 +1,7 @@
-#include <cerrno>
 
-#include "base/text.h"
+#include "device_services.h"
 #include "platform/linux/device/linux_dynamic_loader.h"
 #include "platform/linux/device/linux_system_controls.h"
-#include "platform/linux/preferences/file_preferences.h"
-#include "platform/linux/process/linux_clock.h"
-#include "platform/plist/coding.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -16,18 +11,14 @@ constexpr std::string_view kLibraries = "/etc/tavrel/dynamic-libraries.plist";
 constexpr std::string_view kFaultline =
     "/System/Library/PrivateFrameworks/FaultlineSupport.framework/FaultlineSupport";
 
-class ControlsTest : public testing::Test {
+class ControlsTest : public testing::Test, protected DeviceServices {
  protected:
   void writeList(std::string_view path, const plist::Value& value) {
-    const auto document = coding.encodeXml(value);
-    ASSERT_TRUE(document) << document.error().message;
-    device.write(path, *document);
+    write(path, *coding.encodeXml(value));
   }
 
-  TemporaryRoot device;
-  KeptLog log;
-  FileSystem files;
-  plist::PlistCoding coding;
+  EccEvents eccEvents{root, files, coding, log, EccEvents::Mode::Consume};
+  LinuxSystemControls controls{root, files, coding, log, eccEvents};
 };
 
 TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
@@ -35,6 +26,7 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
   writeList(kControls, plist::Dictionary{{"bytes", plist::Data(bytes)},
                                          {"twelve", 12},
                                          {"all ones", 4294967295},
+                                         {"33 bits", 4294967296},
                                          {"minus two", -2},
                                          {"fails", plist::Dictionary{{"errno", EPERM}}},
                                          {"no errno", plist::Dictionary{{"errno", 0}}},
@@ -42,14 +34,13 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
                                          {"vm.swapusage", 7}});
   // The whole buffer is shown, in hexadecimal.
   using Case = std::tuple<const char*, std::size_t, int, const char*>;
-  EccEvents eccEvents(device.root, files, coding, log, EccEvents::Mode::Consume);
-  LinuxSystemControls controls(device.root, files, coding, log, eccEvents);
   for (const auto& [name, size, errorNumber, shown] :
        {Case("bytes", 4, 0, "010203ee"), Case("bytes", 2, ENOMEM, "eeee"),
         Case("twelve", 8, 0, "0c00000000000000"), Case("twelve", 0, ENOMEM, ""),
         Case("all ones", 4, 0, "ffffffff"), Case("all ones", 3, ENOMEM, "eeeeee"),
-        Case("minus two", 9, 0, "feffffffffffffffff"), Case("fails", 4, EPERM, "eeeeeeee"),
-        Case("no errno", 4, EINVAL, "eeeeeeee"), Case("real", 4, EINVAL, "eeeeeeee"),
+        Case("33 bits", 4, ENOMEM, "eeeeeeee"), Case("minus two", 9, 0, "feffffffffffffffff"),
+        Case("fails", 4, EPERM, "eeeeeeee"), Case("no errno", 4, EINVAL, "eeeeeeee"),
+        Case("real", 4, EINVAL, "eeeeeeee"),
         Case("vm.swapusage", 16, 0, "07000000000000000000000000000000"),
         Case("kern.memorystatus_thaw_count", 4, ENOENT, "eeeeeeee")}) {
     std::vector<std::byte> buffer(size, std::byte{0xee});
@@ -59,23 +50,18 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
     appendHex(content, buffer);
     EXPECT_EQ(content, shown) << name << ' ' << size;
   }
-  const std::string path = device.root.path(kControls);
-  const auto line = [&](const std::string& name) {
-    return path + ": the value of " + name +
-           " is neither bytes nor an integer nor {\"errno\": NUMBER}";
-  };
-  EXPECT_EQ(log.lines, (Lines{line("no errno"), line("real")}));
+  const std::string start = root.path(kControls) + ": the value of ";
+  const std::string end = " is neither bytes nor an integer nor {\"errno\": NUMBER}";
+  EXPECT_EQ(log.lines, (Lines{start + "no errno" + end, start + "real" + end}));
 }
 
 TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
-  device.write(kControls, "<plist>");  // a file that cannot be used hides nothing
+  write(kControls, "<plist>");  // a file that cannot be used hides nothing
   std::uint64_t kibibytes = 0;
   std::ifstream meminfo("/proc/meminfo");
   for (std::string word; meminfo >> word;) {
     if (word == "SwapTotal:") meminfo >> kibibytes;
   }
-  EccEvents eccEvents(device.root, files, coding, log, EccEvents::Mode::Consume);
-  LinuxSystemControls controls(device.root, files, coding, log, eccEvents);
   std::array<std::byte, kSwapUsageBytes> record{};
   const auto result = controls.read("vm.swapusage", record);
   EXPECT_EQ(result.errorNumber, 0);
@@ -90,9 +76,7 @@ TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
 }
 
 TEST_F(ControlsTest, OffersFunctionsUntilTheyAreTakenAway) {
-  LinuxClock clock;
-  FilePreferences preferences(device.root, files, coding, clock, log);
-  LinuxDynamicLoader loader(device.root, files, coding, log, preferences);
+  LinuxDynamicLoader loader(root, files, coding, log, preferences);
   EXPECT_EQ(loader.load("/usr/lib/libc.so.6"), nullptr);
   const auto library = loader.load(kFaultline);
   ASSERT_NE(library, nullptr);

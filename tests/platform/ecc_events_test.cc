@@ -1,13 +1,8 @@
 // The queue of ECC events, and the errors that the kernel counts.
 #include "platform/linux/device/ecc_events.h"
 
-#include <cerrno>
-#include <gtest/gtest.h>
-
-#include "base/text.h"
+#include "device_services.h"
 #include "platform/linux/device/linux_system_controls.h"
-#include "platform/plist/coding.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -15,11 +10,7 @@ namespace {
 constexpr const char* kQueue = "/var/lib/tavrel/ecc-events/";
 constexpr const char* kController = "/sys/devices/system/edac/mc/mc0/";
 
-struct EccDevice : TemporaryRoot {
-  KeptLog log;
-  FileSystem files;
-  plist::PlistCoding coding;
-
+struct EccDevice : DeviceServices {
   EccDevice() {
     count("ce_count", 0);  // in the place of the machine's own
     write("/sys/devices/system/edac/mc/mc0x/ce_count", "9\n");
@@ -27,8 +18,8 @@ struct EccDevice : TemporaryRoot {
   void count(const char* file, std::uint64_t errors) const {
     write(std::string(kController) + file, std::to_string(errors) + "\n");
   }
-  void event(const char* name, char identifier) const {
-    write(kQueue + std::string(name), identifier + std::string(kEccEventBytes - 1, '\0'));
+  void event(const std::string& name, char identifier) const {
+    write(kQueue + name, identifier + std::string(kEccEventBytes - 1, '\0'));
   }
   EccEvents events(EccEvents::Mode mode = EccEvents::Mode::Consume) {
     return {root, files, coding, log, mode};
@@ -43,13 +34,10 @@ std::string all(EccEvents& events) {
     std::array<std::byte, kEccEventBytes> buffer{};
     const auto result = events.next(buffer);
     if (result.errorNumber == ENOENT) return text;
-    if (result.errorNumber != 0) {
-      text += "errno " + std::to_string(result.errorNumber) + "; ";
-      continue;
-    }
-    EXPECT_EQ(result.length, kEccEventBytes);
-    events.filed();
-    text += std::to_string(std::to_integer<int>(buffer[0])) + ":";
+    if (result.errorNumber == 0) events.filed();
+    EXPECT_EQ(result.length, result.errorNumber == 0 ? kEccEventBytes : 0);
+    text += result.errorNumber == 0 ? format("%d:", std::to_integer<int>(buffer[0]))
+                                    : format("errno %d", result.errorNumber);
     for (std::size_t i = 0; i < std::to_integer<std::size_t>(buffer[1]); ++i)
       text += " " + std::to_string(loadLittle64(buffer, 8 + 8 * i).value());
     text += "; ";
@@ -73,10 +61,9 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   EXPECT_EQ(all(peek), "");
   EXPECT_EQ(device.queue(), before);
 
-  const auto lines = [&](const char* outcome) {
-    const std::string what = ": it is neither an event of 72 bytes nor an error number; ";
-    return std::vector{device.root.path(kQueue) + "03.event" + what + outcome,
-                       device.root.path(kQueue) + "04.errno" + what + outcome};
+  const auto lines = [path = device.root.path(kQueue)](const std::string& outcome) {
+    const std::string what = ": it is neither an event of 72 bytes nor an error number; " + outcome;
+    return Lines{path + "03.event" + what, path + "04.errno" + what};
   };
   EXPECT_EQ(device.log.lines, lines("it would be set aside"));
 
@@ -95,8 +82,7 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   }
   auto events = device.events();
   EXPECT_EQ(all(events), "errno 16; 2:; 3:; ");
-  EXPECT_EQ(device.queue(),
-            (std::vector<std::string>{"03.event.unusable", "04.errno.unusable", "notes"}));
+  EXPECT_EQ(device.queue(), (Lines{"03.event.unusable", "04.errno.unusable", "notes"}));
   EXPECT_EQ(device.log.lines, lines("it is set aside"));
   device.event("00.event", 7);  // that arrives while the reader lives
   EXPECT_EQ(all(events), "7:; ");
@@ -110,7 +96,7 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
 TEST(EccEvents, LeaveTheQueueWhenTheyAreFiled) {
   EccDevice device;
   for (char i = 0; i < 12; ++i)
-    device.event((std::string(1, static_cast<char>('a' + i)) + ".event").c_str(), i);
+    device.event(static_cast<char>('a' + i) + std::string(".event"), i);
   auto peek = device.events(EccEvents::Mode::Peek);
   EXPECT_EQ(all(peek), "0:; 1:; 2:; 3:; 4:; 5:; 6:; 7:; 8:; 9:; errno 16; 10:; 11:; ");
   auto events = device.events();
@@ -171,13 +157,12 @@ TEST(EccEvents, AreKeptApartByBoots) {
   look("ffffffff", 5, "9");
   look("00000000", 5, "?");
   look("00000000", 7, "9");
-  const std::string before = "edac-mc0-ce_count-0000000001-FFFFFFFF-0000000000000000000";
-  const std::string after = "edac-mc0-ce_count-0000000002-00000000-0000000000000000000";
   EXPECT_EQ(device.queue(),
-            (std::vector<std::string>{
-                before + "5.event", after + "5.event", after + "7.event",
-                "edac-mc0-ue_count-0000000001-FFFFFFFF-00000000000000000009.event",
-                "edac-mc0-ue_count-0000000002-00000000-00000000000000000009.event"}));
+            (Lines{"edac-mc0-ce_count-0000000001-FFFFFFFF-00000000000000000005.event",
+                   "edac-mc0-ce_count-0000000002-00000000-00000000000000000005.event",
+                   "edac-mc0-ce_count-0000000002-00000000-00000000000000000007.event",
+                   "edac-mc0-ue_count-0000000001-FFFFFFFF-00000000000000000009.event",
+                   "edac-mc0-ue_count-0000000002-00000000-00000000000000000009.event"}));
   auto events = device.events();
   EXPECT_EQ(all(events), "1: 0 2 5; 1: 0 5 5; 1: 0 2 7; 2: 0 9 9; 2: 0 9 9; ");
   EXPECT_TRUE(device.log.lines.empty());

@@ -1,11 +1,8 @@
-#include <array>
 #include <chrono>
 #include <fcntl.h>
-#include <gtest/gtest.h>
-#include <string>
-#include <unistd.h>
 
 #include "platform/linux/process/linux_event_loop.h"
+#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -16,24 +13,22 @@ using Slice = EventLoop::Slice;
 
 struct Pipe {
   Pipe() {
-    std::array<int, 2> ends{};
-    EXPECT_EQ(pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK), 0);
+    int ends[2] = {-1, -1};
+    EXPECT_EQ(pipe2(ends, O_CLOEXEC | O_NONBLOCK), 0);
     reader = Descriptor(ends[0]);
     writer = Descriptor(ends[1]);
   }
   void put() const { EXPECT_EQ(write(writer.get(), "x", 1), 1); }
-  char take() const {
-    char byte = 0;
-    return read(reader.get(), &byte, 1) == 1 ? byte : '\0';
-  }
-  Descriptor reader;
-  Descriptor writer;
+  Descriptor reader, writer;
 };
 
-TEST(LinuxEventLoop, LastsItsFullTimeWithoutEvents) {
-  // Nor does a source that is ready but has nothing to do shorten the slice.
+struct LinuxEventLoopTest : testing::Test {
   LinuxEventLoop loop;
-  const Pipe pipe;
+  const Pipe pipe, other;
+};
+
+TEST_F(LinuxEventLoopTest, LastsItsFullTimeWithoutEvents) {
+  // Nor does a source that is ready but has nothing to do shorten the slice.
   pipe.put();
   const auto source = loop.watch(pipe.reader.get(), [] { return Activity::Nothing; });
   ASSERT_TRUE(source);
@@ -42,45 +37,36 @@ TEST(LinuxEventLoop, LastsItsFullTimeWithoutEvents) {
   EXPECT_GE(std::chrono::steady_clock::now() - begin, 30ms);
 }
 
-TEST(LinuxEventLoop, HandlesOneSourceASliceAndAllInTurn) {
-  LinuxEventLoop loop;
-  const Pipe first, second;
+TEST_F(LinuxEventLoopTest, HandlesOneSourceASliceAndAllInTurn) {
   std::string order;
-  const auto watch = [&](const Pipe& pipe, char name) {
-    return loop.watch(pipe.reader.get(), [&order, &pipe, name] {
-      pipe.take();
-      order += name;
+  const auto watch = [&](const Pipe& source, char name) {
+    return loop.watch(source.reader.get(), [&order, &source, name] {
+      char byte;
+      order.append(static_cast<std::size_t>(read(source.reader.get(), &byte, 1)), name);
       return Activity::Event;
     });
   };
-  const auto a = watch(first, 'a');
-  const auto b = watch(second, 'b');
+  const auto a = watch(pipe, 'a'), b = watch(other, 'b');
   for (int i = 0; i < 3; ++i) {
-    first.put();
-    second.put();
+    pipe.put();
+    other.put();
   }
-  for (int i = 0; i < 6; ++i) {
-    const std::size_t before = order.size();
+  for (std::size_t i = 1; i <= 6; ++i) {
     EXPECT_EQ(loop.runSlice(1h), Slice::HandledEvent);
-    EXPECT_EQ(order.size(), before + 1);
+    EXPECT_EQ(order, std::string("ababab", i));
   }
-  EXPECT_EQ(order, "ababab");
   EXPECT_EQ(loop.runSlice(0ms), Slice::TimedOut);
 }
 
-TEST(LinuxEventLoop, SourcesMayEndThemselvesAndOthers) {
-  LinuxEventLoop loop;
-  const Pipe pipe, other;
+TEST_F(LinuxEventLoopTest, SourcesMayEndThemselvesAndOthers) {
   LinuxEventLoop::Source own, others;
   int calls = 0;
-  auto watched =
-      loop.watch(pipe.reader.get(), [&own, &others, &calls, kept = std::string(99, 'x')] {
-        own.stop();
-        others.stop();
-        calls += kept == std::string(99, 'x') ? 1 : 0;
-        return Activity::Event;
-      });
-  own = *std::move(watched);
+  own = *loop.watch(pipe.reader.get(), [&, kept = std::string(99, 'x')] {
+    own.stop();
+    others.stop();
+    calls += kept == std::string(99, 'x') ? 1 : 0;
+    return Activity::Event;
+  });
   others = *loop.watch(other.reader.get(), [&calls] {
     calls += 100;
     return Activity::Event;

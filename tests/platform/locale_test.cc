@@ -1,12 +1,9 @@
 #include "platform/locale.h"
 
-#include <sys/stat.h>
-
-#include "base/limits.h"
+#include "device_services.h"
 #include "platform/linux/locale/language_matching.h"
 #include "platform/linux/locale/language_tag.h"
 #include "platform/linux/locale/linux_locale.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -57,11 +54,8 @@ TEST(LanguageMatching, PrefersRegionThenParentThenLanguageAndNeverCrossesScripts
   EXPECT_EQ(matchLanguages({"en", "de"}, many), Names{"en"});
 }
 
-class LocaleTest : public testing::Test {
- protected:
-  TemporaryRoot device;
-  KeptLog log;
-  LinuxLocale locale{device.root, log};
+struct LocaleTest : testing::Test, DeviceServices {
+  LinuxLocale locale{root, log};
 };
 
 TEST_F(LocaleTest, TakesPreferencesAndCountryFromTheConfiguration) {
@@ -75,10 +69,10 @@ TEST_F(LocaleTest, TakesPreferencesAndCountryFromTheConfiguration) {
       {"LANG=en_US\nLANGUAGE=::de:C:fr\n", {"de"}, "US"},
       {"LANG=de_DE\nLC_MEASUREMENT=C\n", {"de-DE"}, ""},
       {"LANG\n=\nLANG=\x01\xff\n", {}, ""}};
-  device.write("/etc/default/locale", "LANG=pl_PL.UTF-8\n");
+  write("/etc/default/locale", "LANG=pl_PL.UTF-8\n");
   EXPECT_EQ(locale.preferredLanguages(), Names{"pl-PL"});
   for (const auto& [file, preferred, country] : cases) {
-    device.write("/etc/locale.conf", file);
+    write("/etc/locale.conf", file);
     EXPECT_EQ(locale.preferredLanguages(), preferred) << file;
     EXPECT_EQ(locale.countryCode().value_or(""), country) << file;
   }
@@ -87,25 +81,25 @@ TEST_F(LocaleTest, TakesPreferencesAndCountryFromTheConfiguration) {
 
 TEST_F(LocaleTest, ListsTheLanguagesOfTheSystem) {
   EXPECT_EQ(locale.systemLanguages(), Names{"en"});
-  device.write("/etc/locale.conf", "LANG=fi_FI\n");
-  device.write("/etc/locale.gen", "# de_DE.UTF-8 UTF-8\nC.UTF-8 UTF-8\n");
-  device.write("/usr/lib/locale/locale-archive", "sv_SE");
+  write("/etc/locale.conf", "LANG=fi_FI\n");
+  write("/etc/locale.gen", "# de_DE.UTF-8 UTF-8\nC.UTF-8 UTF-8\n");
+  write("/usr/lib/locale/locale-archive", "sv_SE");
   EXPECT_EQ(locale.systemLanguages(), (Names{"en", "fi-FI"}));
 
-  device.write("/etc/locale.gen", "zh_TW BIG5\n de_DE.UTF-8 UTF-8\nde_DE ISO-8859-1\n");
-  device.write("/usr/lib/locale/fr_FR.utf8/LC_TIME", "");
+  write("/etc/locale.gen", "zh_TW BIG5\n de_DE.UTF-8 UTF-8\nde_DE ISO-8859-1\n");
+  write("/usr/lib/locale/fr_FR.utf8/LC_TIME", "");
   EXPECT_EQ(locale.systemLanguages(), (Names{"en", "de-DE", "fr-FR", "zh-TW"}));
 
-  std::filesystem::remove(device.root.path("/etc/locale.conf"));
-  ASSERT_EQ(mkfifo(device.root.path("/etc/locale.conf").c_str(), 0600), 0);
+  std::filesystem::remove(root.path("/etc/locale.conf"));
+  ASSERT_EQ(mkfifo(root.path("/etc/locale.conf").c_str(), 0600), 0);
   EXPECT_EQ(locale.preferredLanguages(), Names{});
   EXPECT_EQ(locale.countryCode(), std::nullopt);
   EXPECT_EQ(log.lines.size(), 1U) << "told once, and never waited for";
   log.lines.clear();
 
-  device.write("/etc/tavrel/languages", "# screens\nde\n\nzh_TW\nno language\n");
+  write("/etc/tavrel/languages", "# screens\nde\n\nzh_TW\nno language\n");
   EXPECT_EQ(locale.systemLanguages(), (Names{"de", "zh-TW"}));
-  EXPECT_EQ(log.lines, Names{device.root.path("/etc/tavrel/languages") +
+  EXPECT_EQ(log.lines, Names{root.path("/etc/tavrel/languages") +
                              ": \"no language\" is no language; write one tag a line, such as de "
                              "or pt-BR"});
 }

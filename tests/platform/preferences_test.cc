@@ -1,48 +1,31 @@
 #include <cmath>
-#include <memory>
 
-#include "base/limits.h"
-#include "base/text.h"
+#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/logs/json_line.h"
-#include "platform/linux/preferences/file_preferences.h"
-#include "platform/linux/process/linux_clock.h"
-#include "platform/plist/coding.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr std::string_view kDomain = "com.example.domain";
 constexpr std::string_view kFile = "/var/mobile/Library/Preferences/com.example.domain.plist";
 
 /// One process's view of a device's preferences.
-struct Process {
-  Process(const DeviceRoot& root, FileSystem& fileSystem)
-      : preferences(
-            std::make_unique<FilePreferences>(root, fileSystem, propertyLists, clock, log)) {}
-  explicit Process(const DeviceRoot& root) : Process(root, ownFiles) {}
+struct Process : ProcessServices {
+  using ProcessServices::ProcessServices;
 
   std::string get(std::string_view key) {
-    return textOf(preferences->ZTXPreferencesGetValue(key, kDomain));
+    return textOf(preferences.ZTXPreferencesGetValue(key, kDomain));
   }
   void set(std::string_view key, const plist::Value& value) {
-    preferences->ZTXPreferencesSetValue(key, value, kDomain);
+    preferences.ZTXPreferencesSetValue(key, value, kDomain);
   }
-  bool synchronize() { return preferences->ZTXPreferencesSynchronize(kDomain); }
+  bool synchronize() { return preferences.ZTXPreferencesSynchronize(kDomain); }
   std::string all() {
     std::string text;
-    appendJson(text, preferences->values(kDomain));
+    appendJson(text, preferences.values(kDomain));
     return text;
   }
-
-  QuickFileSystem ownFiles;
-  plist::PlistCoding propertyLists;
-  LinuxClock clock;
-  KeptLog log;
-  std::unique_ptr<FilePreferences> preferences;
 };
 
 TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
@@ -52,7 +35,7 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   const plist::Array list{1, 2};
   here.set("a", list);
   plist::Array(list).append(3);  // the caller's own, before and after
-  here.preferences->ZTXPreferencesGetValue("a", kDomain).array().append(4);
+  here.preferences.ZTXPreferencesGetValue("a", kDomain).array().append(4);
   EXPECT_EQ(here.get("a"), "[1, 2]");
   EXPECT_EQ(there.get("a"), "(null)");
   EXPECT_TRUE(here.synchronize());
@@ -68,41 +51,9 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   EXPECT_TRUE(there.synchronize());
   EXPECT_EQ(there.all(), R"({"b":true,"c":"text"})");
 
-  here.set("d", std::int64_t{-5});
-  here.preferences.reset();
-  Process later(device.root);
-  EXPECT_EQ(later.preferences->ZTXPreferencesGetIntegerValue("d", kDomain), -5);
+  Process(device.root).set("d", std::int64_t{-5});
+  EXPECT_EQ(Process(device.root).get("d"), "-5");
   EXPECT_TRUE(here.log.lines.empty() && there.log.lines.empty());
-}
-
-TEST(Preferences, WritersInSeveralProcessesLoseNothing) {
-  const TemporaryRoot device;
-  constexpr int kWriters = 4;
-  constexpr int kRounds = 50;
-  int gate[2];
-  ASSERT_EQ(pipe(gate), 0);
-  for (int writer = 0; writer < kWriters; ++writer) {
-    if (fork() == 0) {
-      close(gate[1]);
-      char end;
-      bool done = read(gate[0], &end, 1) == 0;  // all begin when the last has been started
-      Process process(device.root);
-      for (int round = 0; round < kRounds; ++round) {
-        process.set(std::to_string(writer * 100 + round), round);
-        done = process.synchronize() && done;
-      }
-      _exit(done ? 0 : 1);
-    }
-  }
-  close(gate[0]);
-  close(gate[1]);
-  for (int writer = 0; writer < kWriters; ++writer) {
-    int status = -1;
-    wait(&status);
-    EXPECT_EQ(status, 0);
-  }
-  EXPECT_EQ(Process(device.root).preferences->values(kDomain).size(),
-            std::size_t{kWriters * kRounds});
 }
 
 TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
@@ -118,11 +69,10 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
     EXPECT_EQ(process.all(), R"({"a":1})");
     std::string aside;
     for (const auto& entry : fs::directory_iterator(device.root.path(kFile.substr(0, 31)))) {
-      const std::string name = entry.path().filename();
-      if (name.starts_with("com.example.domain.plist.corrupt-")) aside = entry.path();
+      if (entry.path().extension().string().starts_with(".corrupt-")) aside = entry.path();
     }
-    EXPECT_EQ(*FileSystem().read(aside, 100), content);
-    EXPECT_EQ(process.preferences->domains()->size(), 1U);
+    EXPECT_EQ(contentOf(aside), content);
+    EXPECT_EQ(process.preferences.domains()->size(), 1U);
   }
 }
 
@@ -165,8 +115,8 @@ TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
   const TemporaryRoot device;
   Process process(device.root);
   for (const std::string name : {"", ".hidden", "../../etc/passwd", "a/b", "line\nend"}) {
-    process.preferences->ZTXPreferencesSetValue("k", 1, name);
-    EXPECT_FALSE(process.preferences->ZTXPreferencesSynchronize(name));
+    process.preferences.ZTXPreferencesSetValue("k", 1, name);
+    EXPECT_FALSE(process.preferences.ZTXPreferencesSynchronize(name));
   }
   ASSERT_EQ(process.log.lines.size(), 5U);
   EXPECT_EQ(process.log.lines[1],
@@ -180,9 +130,6 @@ TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
 }
 
 TEST(Preferences, AreOldOrNewAfterEveryFault) {
-  // What the file may hold after each step that was reported as done.
-  const std::string kStates[] = {R"({"a":"old","kept":1})", R"({"a":"new","kept":1})",
-                                 R"({"b":2,"kept":1})"};
   const auto makeSteps = [](Process& process) {
     int done = 0;
     process.set("a", "new");
@@ -193,6 +140,10 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
     return done;
   };
   for (const bool corrupt : {false, true}) {
+    // What the file may hold after each step that was reported as done.
+    const Lines states = corrupt ? Lines{"{}", R"({"a":"new"})", R"({"b":2})"}
+                                 : Lines{R"({"a":"old","kept":1})", R"({"a":"new","kept":1})",
+                                         R"({"b":2,"kept":1})"};
     for (const auto fault : FaultyFileSystem::kFaults) {
       int call = 1;
       for (bool struck = true; struck; ++call) {
@@ -218,17 +169,13 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
           faulty.settle();
           Process after(device.root);
           const std::string found = after.all();
-          if (!corrupt) {
-            EXPECT_NE(std::find(kStates + done, std::end(kStates), found), std::end(kStates))
-                << found << " although step " << done << " was done";
-          } else if (done == 2) {
-            EXPECT_EQ(found, R"({"b":2})");
-          }
+          EXPECT_NE(std::find(states.begin() + done, states.end(), found), states.end())
+              << found << " although step " << done << " was done";
           EXPECT_TRUE(corrupt || after.log.lines.empty());
         }
         Process again(device.root);
         EXPECT_EQ(makeSteps(again), 2);
-        EXPECT_EQ(Process(device.root).all(), corrupt ? R"({"b":2})" : kStates[2]);
+        EXPECT_EQ(Process(device.root).all(), states[2]);
         ASSERT_LT(call, 200);
       }
     }

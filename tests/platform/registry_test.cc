@@ -1,13 +1,8 @@
 // The recorded registry: services, numbered methods, the hub, and the folder of recordings.
-#include <gtest/gtest.h>
 
-#include "base/format.h"
-#include "base/limits.h"
-#include "base/text.h"
+#include "device_services.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recorded_snapshots.h"
-#include "platform/plist/coding.h"
-#include "temporary_root.h"
 
 namespace tavrel {
 namespace {
@@ -16,15 +11,12 @@ using plist::Array;
 using plist::Data;
 using plist::Dictionary;
 using plist::Value;
-using Lines = std::vector<std::string>;
 
-std::vector<std::byte> bytesOf(std::initializer_list<int> values) {
-  std::vector<std::byte> bytes;
-  for (const int value : values)
-    bytes.push_back(static_cast<std::byte>(value));
-  return bytes;
+std::vector<std::byte> bytesOf(std::initializer_list<unsigned char> values) {
+  const auto bytes = std::as_bytes(std::span(values.begin(), values.size()));
+  return {bytes.begin(), bytes.end()};
 }
-Data dataOf(std::initializer_list<int> values) {
+Data dataOf(std::initializer_list<unsigned char> values) {
   return Data(bytesOf(values));
 }
 std::string hexOf(ByteSpan bytes) {
@@ -129,7 +121,11 @@ struct Client {
   std::size_t length = 0;
 };
 
-TEST(RecordedServices, MatchByClassAndProperties) {
+struct RegistryTest : testing::Test {
+  KeptLog log;
+};
+
+TEST_F(RegistryTest, ServicesMatchByClassAndProperties) {
   const Array legend{1, 2};
   const std::string longName = std::string(126, 'n') + "\xC3\xBC";
   const Dictionary own{{"p", true}}, counted{{"p", 1}, {"legend", legend}};
@@ -141,7 +137,6 @@ TEST(RecordedServices, MatchByClassAndProperties) {
                        service("B", {{"Properties", counted}}),
                        service("A", {{"Name", longName + " and more"}, {"Properties", both}}),
                        service("C", {{"NameError", kKernelIOError}})};
-  KeptLog log;
   RecordedRegistry registry({{"Services", services}}, log);
   const auto property = [](const Value& match) { return Dictionary{{"IOPropertyMatch", match}}; };
   Dictionary classAndLegend = property(Dictionary{{"legend", Array{1, 2}}});
@@ -167,7 +162,7 @@ TEST(RecordedServices, MatchByClassAndProperties) {
   EXPECT_FALSE(found->property("none"));
 }
 
-TEST(RecordedServices, KeepIdsCountsAndParents) {
+TEST_F(RegistryTest, ServicesKeepIdsCountsAndParents) {
   constexpr std::uint64_t kMost = 0xFFFFFFFFFFFFFFFF;
   const auto node = [](const char* className, const Value& id, const Value& parents,
                        const Dictionary& properties = {}) {
@@ -187,7 +182,6 @@ TEST(RecordedServices, KeepIdsCountsAndParents) {
                        node("None", {}, kMost),
                        node("Last", kMost, -1, {{"own", 1}}),
                        refusing};
-  KeptLog log;
   RecordedRegistry registry({{"Services", services}}, log);
   EXPECT_EQ(log.lines, Lines{});
   std::string ids;
@@ -220,7 +214,7 @@ TEST(RecordedServices, KeepIdsCountsAndParents) {
       "(null) (null) (null) ");
 }
 
-TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
+TEST_F(RegistryTest, DriversAnswerWithTheFirstRowThatFits) {
   const auto row = [](int method, Dictionary more) {
     more.set("Method", method);
     return more;
@@ -232,7 +226,6 @@ TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
                       row(9, {{"OutputLength", 4}, {"Output", dataOf({8})}}),
                       row(10, {{"OutputLength", -1}}),
                       row(11, {{"Scalars", Array{5, -1}}})};
-  KeptLog log;
   const Array services{service("D", {{"CloseError", kKernelIOError}, {"Methods", methods}})};
   RecordedRegistry registry({{"Services", services}}, log);
   Client client(registry, "D");
@@ -265,7 +258,7 @@ TEST(RecordedDriver, AnswersWithTheFirstRowThatFits) {
   EXPECT_EQ(client.call(11), kKernelBadArgument);
 }
 
-TEST(RecordedRegistryTest, LeavesOutWhatIsMalformed) {
+TEST_F(RegistryTest, LeavesOutWhatIsMalformed) {
   const Value slips[] = {"0xE00002BC", 1.5, true, Array{5, "6"}};
   Lines lines{"\"Generation\" is left out: it must be an integer"};
   Array services = Array::create(), rows = Array::create();
@@ -294,7 +287,6 @@ TEST(RecordedRegistryTest, LeavesOutWhatIsMalformed) {
   rows.append(Dictionary{{"Method", 8}, {"Output", dataOf({7})}});
   services.append(service("B", {{"Methods", rows}}));
   const Dictionary errors{{"0", "0xE00002CA"}, {"2", 6}};
-  KeptLog log;
   RecordedRegistry registry({{"Generation", "7"},
                              {"Services", services},
                              {"Hub", Dictionary{{"Channels", 5}, {"MethodErrors", errors}}}},
@@ -317,8 +309,7 @@ Dictionary exampleHub() {
       {hubChannel(1, 10, group(1, 10, 1, 100)), hubChannel(1, 11, three), hubChannel(2, 10, two)});
 }
 
-TEST(ReportHub, FillsTheBufferInOrderOfInterest) {
-  KeptLog log;
+TEST_F(RegistryTest, TheHubFillsTheBufferInOrderOfInterest) {
   auto registry = std::make_unique<RecordedRegistry>(exampleHub(), log);
   Client client(*registry);
   ASSERT_EQ(client.subscribe(interests(5, {{2, 10}, {5, 5}, {1, 11}, {2, 10}, {1, 10}})), 0U);
@@ -354,8 +345,7 @@ TEST(ReportHub, FillsTheBufferInOrderOfInterest) {
   EXPECT_EQ(log.lines, Lines{});
 }
 
-TEST(ReportHub, RefusesMalformedCalls) {
-  KeptLog log;
+TEST_F(RegistryTest, TheHubRefusesMalformedCalls) {
   RecordedRegistry registry(exampleHub(), log);
   Client client(registry);
   const auto one = interests(1, {{1, 10}});
@@ -392,21 +382,20 @@ TEST(ReportHub, RefusesMalformedCalls) {
   channels.emplace_back(1, 2);
   EXPECT_EQ(greedy.call(2, {}, interests(33, channels), 1), kKernelNoMemory);
   EXPECT_EQ(greedy.client->close(), kKernelSuccess);
-  EXPECT_EQ(greedy.call(3, {1}), kKernelBadArgument);
+  EXPECT_EQ(greedy.call(0), kKernelBadArgument);
   EXPECT_EQ(log.lines, Lines{});
 }
 
-TEST(ReportHub, RefusesWhatTheRecordingRefuses) {
-  KeptLog log;
+TEST_F(RegistryTest, TheHubRefusesWhatTheRecordingRefuses) {
   const auto code = [&](const char* key, const Value& refusal) {
     const Dictionary recording = exampleHub();
     recording.dictionary("Hub").set(key, refusal);
     RecordedRegistry registry(recording, log);
     Client client(registry);
-    KernelReturn last = client.opened;
-    if (!last) last = client.subscribe(interests(1, {{1, 10}}));
-    if (!last) last = client.call(3, {client.bufferID});
-    return last ? last : client.client->close();
+    if (client.opened) return client.opened;
+    if (const auto refused = client.subscribe(interests(1, {{1, 10}}))) return refused;
+    const auto updated = client.call(3, {client.bufferID});
+    return updated ? updated : client.client->close();
   };
   for (const char* method : {"0", "2", "3"})
     EXPECT_EQ(code("MethodErrors", Dictionary{{method, 0xE00002C5}, {"0x", 1}}), 0xE00002C5);
@@ -429,38 +418,33 @@ TEST(ReportHub, RefusesWhatTheRecordingRefuses) {
   ASSERT_EQ(client.subscribe(interests(1, {{1, 1}})), kKernelSuccess);
   EXPECT_EQ(client.update(), "1/1*1=4 ");
   ASSERT_EQ(log.lines.size(), 9U);
-  const std::string channel = "recording: hub channel ";
-  EXPECT_EQ(log.lines[4], channel +
-                              "4 is left out: its \"Elements\" are no groups of it; give elements "
-                              "of 64 bytes with its ids, the first with their number at offset 20");
-  EXPECT_EQ(log.lines[5], channel +
-                              "5 is left out: it has no \"DriverID\" or no \"ChannelID\"; give "
-                              "integers");
-  EXPECT_EQ(log.lines[7], channel +
-                              "8 is left out: an earlier one has its ids; give each channel of a "
-                              "driver its own");
+  for (const auto& [line, text] :
+       {std::pair(4U,
+                  "4 is left out: its \"Elements\" are no groups of it; give elements of 64 "
+                  "bytes with its ids, the first with their number at offset 20"),
+        std::pair(5U, "5 is left out: it has no \"DriverID\" or no \"ChannelID\"; give integers"),
+        std::pair(7U,
+                  "8 is left out: an earlier one has its ids; give each channel of a driver "
+                  "its own")})
+    EXPECT_EQ(log.lines[line], std::string("recording: hub channel ") + text);
   RecordedRegistry empty(Dictionary::create(), log);
   EXPECT_EQ(empty.firstService("IOReportHub"), nullptr);
 }
 
-class RecordingFolderTest : public testing::Test {
+class RecordingFolderTest : public testing::Test, protected DeviceServices {
  protected:
-  void write(const std::string& name, const Value& recording) {
-    device.write("/var/lib/tavrel/registry/" + name, *coding.encodeXml(recording));
+  void record(const std::string& name, const Value& recording) {
+    write("/var/lib/tavrel/registry/" + name, *coding.encodeXml(recording));
   }
   std::string path(const std::string& name) const {
-    return device.root.path("/var/lib/tavrel/registry/" + name);
+    return root.path("/var/lib/tavrel/registry/" + name);
   }
   static Dictionary withService(std::string_view name, int generation) {
     const Array services{service("S", {{"Name", name}, {"EntryID", 1}})};
     return {{"Generation", generation}, {"Services", services}};
   }
 
-  TemporaryRoot device;
-  KeptLog log;
-  FileSystem files;
-  plist::PlistCoding coding;
-  RecordedRegistry registry{device.root, files, coding, log};
+  RecordedRegistry registry{root, files, coding, log};
 };
 
 TEST_F(RecordingFolderTest, FollowsItsFiles) {
@@ -468,10 +452,10 @@ TEST_F(RecordingFolderTest, FollowsItsFiles) {
   EXPECT_EQ(walk(registry), "");
   EXPECT_EQ(log.lines, Lines{});
 
-  write("b.plist", withService("b", 1));
-  write("a.plist", withService("a", 2));
-  write("c.xml", withService("c", 4));
-  device.write("/var/lib/tavrel/registry/d.plist", "nonsense");
+  record("b.plist", withService("b", 1));
+  record("a.plist", withService("a", 2));
+  record("c.xml", withService("c", 4));
+  write("/var/lib/tavrel/registry/d.plist", "nonsense");
   EXPECT_EQ(walk(registry), "a b ");
   EXPECT_EQ(walk(registry), "a b ");
   ASSERT_EQ(log.lines.size(), 2U);  // what is wrong is told once
@@ -479,28 +463,28 @@ TEST_F(RecordingFolderTest, FollowsItsFiles) {
   EXPECT_TRUE(log.lines[1].starts_with(path("b.plist") + ": entry id 1 of a S is that of "));
 
   // A walk keeps what it began with, and says whether the generation is still the same.
-  EXPECT_EQ(walk(registry, all, [&] { write("e.plist", withService("e", 0)); }), "a b ");
-  EXPECT_EQ(walk(registry, all, [&] { write("b.plist", withService("b2", 2)); }), "a b e !");
+  EXPECT_EQ(walk(registry, all, [&] { record("e.plist", withService("e", 0)); }), "a b ");
+  EXPECT_EQ(walk(registry, all, [&] { record("b.plist", withService("b2", 2)); }), "a b e !");
   EXPECT_EQ(walk(registry), "a b2 e ");
-  std::filesystem::remove_all(device.root.path("/var/lib/tavrel/registry"));
+  std::filesystem::remove_all(root.path("/var/lib/tavrel/registry"));
   EXPECT_EQ(walk(registry), "");
 
   // The generation of a dictionary that is played is seen at once.
   Dictionary played = withService("p", 1);
   RecordedRegistry player(played, log);
-  const std::string aborted = walk(player, all, [&] {
+  const auto change = [&] {
     played.set("Generation", 2);
     played.array("Services").append(service("T"));
-  });
-  EXPECT_EQ(aborted, "p !");
+  };
+  EXPECT_EQ(walk(player, all, change), "p !");
   EXPECT_EQ(walk(player), "p T ");
 }
 
 TEST_F(RecordingFolderTest, HoldsASnapshot) {
-  const auto snapshot = RecordedSnapshots(device.root, files, log).create();
+  const auto snapshot = RecordedSnapshots(root, files, log).create();
   EXPECT_FALSE(snapshot->capture());
   EXPECT_EQ(log.lines, Lines{});
-  device.write("/var/lib/tavrel/registry/stack-snapshot.bin", "bytes");
+  write("/var/lib/tavrel/registry/stack-snapshot.bin", "bytes");
   EXPECT_TRUE(snapshot->capture());
   EXPECT_EQ(asText(*snapshot->buffer()), "bytes");
   std::filesystem::resize_file(path("stack-snapshot.bin"), limits::kDeviceAllocationBytes + 1);
@@ -513,14 +497,13 @@ TEST_F(RecordingFolderTest, IsOneRecordingThatPlaysTheSame) {
   Dictionary first = exampleHub();
   first.dictionary("Hub").set("MethodErrors", Dictionary{{"4", 5}});
   first.set("Services", Array{service("A", {{"Methods", Array::create()}})});
-  write("1.plist", first);
-  Dictionary second = hub({hubChannel(3, 3, group(3, 3, 1, 33))});
-  second.dictionary("Hub").set("EntryID", 10);
-  second.dictionary("Hub").set("MapError", 0);
-  second.dictionary("Hub").set("MethodErrors", Dictionary{{"4", 6}, {"5", 7}});
-  second.set("Generation", 7);
-  second.set("Services", Array{service("B")});
-  write("2.plist", second);
+  record("1.plist", first);
+  const Dictionary hubOfSecond{{"EntryID", 10},
+                               {"Channels", Array{hubChannel(3, 3, group(3, 3, 1, 33))}},
+                               {"MapError", 0},
+                               {"MethodErrors", Dictionary{{"4", 6}, {"5", 7}}}};
+  record("2.plist",
+         Dictionary{{"Hub", hubOfSecond}, {"Generation", 7}, {"Services", Array{service("B")}}});
   const Dictionary merged = registry.recording();
   RecordedRegistry player(merged, log);
   for (RecordedRegistry* played : {&registry, &player}) {

@@ -1,5 +1,4 @@
-// What most tests of the platform need: a device root in a temporary folder, a system log that is
-// kept, and processes.
+// A device root in a temporary folder, a system log that is kept, and processes.
 #pragma once
 
 #include <algorithm>
@@ -29,8 +28,10 @@ inline std::string contentOf(const std::filesystem::path& path) {
 
 /// Removed with everything in it at the end.
 class TemporaryRoot {
+  const std::string folder_ = makeFolder();
+
  public:
-  TemporaryRoot() : folder_(makeFolder()), root(folder_) {}
+  TemporaryRoot() = default;
   TemporaryRoot(const TemporaryRoot&) = delete;
   TemporaryRoot& operator=(const TemporaryRoot&) = delete;
   ~TemporaryRoot() { std::filesystem::remove_all(folder_); }
@@ -43,6 +44,7 @@ class TemporaryRoot {
     stream << content;
     ASSERT_TRUE(stream.flush()) << file;
   }
+  const DeviceRoot root{folder_};
 
  private:
   static std::string makeFolder() {
@@ -54,20 +56,14 @@ class TemporaryRoot {
     EXPECT_NE(mkdtemp(name.data()), nullptr) << name;
     return name;
   }
-
-  std::string folder_;
-
- public:
-  const DeviceRoot root;
 };
 
 class KeptLog final : public SystemLog {
  public:
   void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
   bool says(std::string_view part) const {
-    return std::any_of(lines.begin(), lines.end(), [part](const std::string& line) {
-      return line.find(part) != std::string::npos;
-    });
+    return std::ranges::any_of(
+        lines, [part](const std::string& line) { return line.find(part) != line.npos; });
   }
   Lines lines;
 };

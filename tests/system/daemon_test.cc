@@ -1,7 +1,5 @@
 // The daemon as a process, on a device of its own.
-#include <algorithm>
 #include <array>
-#include <filesystem>
 #include <sstream>
 
 #include "config/bh_config.h"
@@ -33,30 +31,38 @@ void runDaemon(const DeviceRoot& root, const char* argument) {
   runTavrel(linuxPlatform.platform(), arguments);
 }
 
+/// Runs the built program and yields what it logged, without the times.
+std::string logBelow(const std::string& root, const char* argument, const std::string& errors) {
+  EXPECT_EQ(waitFor(forkProcess([&] { executeBelow(root, argument); }, errors)), 0);
+  std::istringstream lines(contentOf(errors));
+  std::string log;
+  for (std::string line; std::getline(lines, line);)
+    log += line.substr(line.find(' ') + 1) + '\n';
+  return log;
+}
+
 constexpr int kEccEvents = 3;
 
 /// A device with permission, a whitelist, a scheduled tasking and yesterday's statistics, a storage
 /// driver, report channels and memory errors.
-struct Device {
-  TemporaryRoot folder;
-  const DeviceRoot& root = folder.root;
+struct Device : TemporaryRoot {
   std::int32_t yesterday = 0;
 
   Device() {
     const Dictionary keys{{"k", Dictionary::create()}};
-    folder.write(kWhitelistPath,
-                 *plist::writeXml(Dictionary{
-                     {"g", Dictionary{{"ScalarKeys", keys}, {"DistributionKeys", keys}}}}));
+    write(kWhitelistPath,
+          *plist::writeXml(
+              Dictionary{{"g", Dictionary{{"ScalarKeys", keys}, {"DistributionKeys", keys}}}}));
     for (const char* recording : {"report.plist", "storage.plist"}) {
-      folder.write(std::string("/var/lib/tavrel/registry/") + recording,
-                   contentOf(std::string(TAVREL_EXAMPLES "/registry/") + recording));
+      write(std::string("/var/lib/tavrel/registry/") + recording,
+            contentOf(std::string(TAVREL_EXAMPLES "/registry/") + recording));
     }
     for (int i = 0; i < kEccEvents; ++i) {
       std::string event(72, '\0');
       event[0] = static_cast<char>(i);
-      folder.write(format("/var/lib/tavrel/ecc-events/%d.event", i), event);
+      write(format("/var/lib/tavrel/ecc-events/%d.event", i), event);
     }
-    folder.write("/sys/devices/system/edac/mc/mc0/ce_count", "0\n");
+    write("/sys/devices/system/edac/mc/mc0/ce_count", "0\n");
     LinuxPlatform linuxPlatform(root);
     Platform& platform = linuxPlatform.platform();
     platform.preferences->ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
@@ -114,14 +120,14 @@ struct Device {
     return count;
   }
 
-  /// How many scalars the storage run has set for today.
-  int storageScalars() const {
+  /// The values of yesterday and today.
+  std::vector<std::int64_t> scalars(std::string_view prefix) const {
     LinuxPlatform linuxPlatform(root);
-    int count = 0;
+    std::vector<std::int64_t> values;
     linuxPlatform.platform().statistics->initWithDefaultPath()->scalarsForKeyPrefix(
-        "com.norvane.", yesterday, yesterday + 1,
-        [&count](std::string_view, std::int32_t, std::int64_t, bool&) { ++count; });
-    return count;
+        prefix, yesterday - 1, yesterday + 1,
+        [&](auto, auto, auto value, auto&) { values.push_back(value); });
+    return values;
   }
 
   plist::Value preference(std::string_view domain, std::string_view key) const {
@@ -129,24 +135,10 @@ struct Device {
     return linuxPlatform.platform().preferences->ZTXPreferencesGetValue(key, domain);
   }
 
-  /// Runs the built program and yields what it logged, without the times.
   std::string logOf(const char* argument) const {
-    const std::string errors = root.path("/errors");
-    const int daemon = forkProcess([&] { execute(argument); }, errors);
-    EXPECT_EQ(waitFor(daemon), 0);
-    std::istringstream lines(contentOf(errors));
-    std::string log;
-    for (std::string line; std::getline(lines, line);)
-      log += line.substr(line.find(' ') + 1) + '\n';
-    return log;
+    return logBelow(root.path("/"), argument, root.path("/errors"));
   }
-
-  /// Becomes the built program.
-  void execute(const char* argument) const {
-    ::setenv("TAVREL_ROOT", root.path("/").c_str(), 1);
-    ::execl(TAVREL_BINARY, "tavrel", argument, nullptr);
-    ::_exit(127);
-  }
+  void execute(const char* argument) const { executeBelow(root.path("/"), argument); }
 };
 
 TEST(DaemonTest, RunsOnceADayAndByForce) {
@@ -170,18 +162,9 @@ TEST(DaemonTest, RunsOnceADayAndByForce) {
 TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
   const TemporaryRoot folder;
   const std::string none = folder.root.path("/none");
-  const std::string errors = folder.root.path("/errors");
-  const int daemon = forkProcess(
-      [&] {
-        ::setenv("TAVREL_ROOT", none.c_str(), 1);
-        ::execl(TAVREL_BINARY, "tavrel", "-d", nullptr);
-      },
-      errors);
-  EXPECT_EQ(waitFor(daemon), 0);
-  const std::string line = contentOf(errors);
-  EXPECT_EQ(line.substr(line.find(' ')), " error cannot use device root " + none +
-                                             "/: No such file or directory: name the device's "
-                                             "folder with TAVREL_ROOT\n");
+  EXPECT_EQ(logBelow(none, "-d", folder.root.path("/errors")),
+            "error cannot use device root " + none +
+                "/: No such file or directory: name the device's folder with TAVREL_ROOT\n");
   EXPECT_FALSE(std::filesystem::exists(none));
 }
 
@@ -191,13 +174,8 @@ TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
     const int daemon = forkProcess([&] {
       int gone[2];  // a pipe whose reader has gone
       if (::pipe(gone) != 0 || ::close(gone[0]) != 0) ::_exit(126);
-      for (const int stream : {0, 1, 2}) {
-        if (areClosed) {
-          ::close(stream);
-        } else {
-          ::dup2(gone[1], stream);
-        }
-      }
+      for (const int stream : {0, 1, 2})
+        areClosed ? ::close(stream) : ::dup2(gone[1], stream);
       ::close(gone[1]);
       device.execute("-d");
     });
@@ -225,11 +203,9 @@ TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
   ASSERT_TRUE(client) << client.error().message;
   ASSERT_TRUE(client->send({{"operation", 0}}));
   const auto asked = notifications.waitBeyond(kLoggingNotification, 0, std::chrono::seconds(60));
-  ASSERT_TRUE(asked);
-  EXPECT_EQ(*asked, 1U);
-  const Dictionary app{{"bundle_id", "com.example.walk"},
-                       {"version", "1.2"},
-                       {"uuid", "00112233-4455-6677-8899-AABBCCDDEEFF"}};
+  ASSERT_TRUE(asked && *asked == 1U);
+  const std::string uuid = "00112233-4455-6677-8899-AABBCCDDEEFF";
+  const Dictionary app{{"bundle_id", "com.example.walk"}, {"version", "1.2"}, {"uuid", uuid}};
   ASSERT_TRUE(client->send({{"operation", 2}, {"app_data", Array{app}}}));
 
   EXPECT_EQ(waitFor(daemon), 0);  // after its ten idle seconds
@@ -242,6 +218,7 @@ TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
 TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
   const Device device;
   std::vector<int> processes;
+  constexpr int kKeys = 50;
   for (int i = 0; i < 8; ++i) {
     processes.push_back(forkProcess([&] { runDaemon(device.root, "-f"); }));
     processes.push_back(forkProcess([&] {
@@ -250,17 +227,19 @@ TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
       if (!batch || !(*batch)->addScalar(device.yesterday, "sum", 1) || !(*batch)->commit()) {
         ::_exit(1);
       }
+      const auto preferences = linuxPlatform.platform().preferences;
+      for (int key = 0; key < kKeys; ++key) {
+        preferences->ZTXPreferencesSetValue(std::to_string(i * kKeys + key), 1, "com.shared");
+        if (!preferences->ZTXPreferencesSynchronize("com.shared")) ::_exit(2);
+      }
     }));
   }
   for (const int process : processes)
     EXPECT_EQ(waitFor(process), 0);
   EXPECT_EQ(device.pendingLogs().size(), 8U);
-  std::int64_t sum = 0;
-  LinuxPlatform linuxPlatform(device.root);
-  linuxPlatform.platform().statistics->initWithDefaultPath()->scalarsForKeyPrefix(
-      "sum", device.yesterday - 1, device.yesterday,
-      [&sum](std::string_view, std::int32_t, std::int64_t value, bool&) { sum = value; });
-  EXPECT_EQ(sum, 8);
+  EXPECT_EQ(device.scalars("sum"), std::vector<std::int64_t>{8});
+  for (int key = 0; key < 8 * kKeys; ++key)
+    EXPECT_TRUE(device.preference("com.shared", std::to_string(key))) << key;
 }
 
 // A run is killed before one of its system calls, over the whole run; the next one must then find
@@ -277,7 +256,7 @@ TEST(DaemonTest, RecoversWhereverARunIsKilled) {
     EXPECT_EQ(device.preference(kTavrelDomain, kLastRunDayKey), plist::Value(device.yesterday));
     EXPECT_EQ(device.preference(kTavrelDomain, kTaskingIDKey), plist::Value("t"));
     EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
-    EXPECT_EQ(device.storageScalars(), 335);
+    EXPECT_EQ(device.scalars("com.norvane.").size(), 335U);
     const int repeated = device.eccEvents() - kEccEvents;
     EXPECT_TRUE(repeated == 0 || repeated == 1) << repeated;  // filed, and not out of the queue yet
     const std::size_t logs = device.pendingLogs().size();

@@ -1,10 +1,5 @@
 // The daemon as a process on a small file system that is nearly full.
-#include <algorithm>
-#include <cstdlib>
-#include <fcntl.h>
-#include <iterator>
 #include <sys/statvfs.h>
-#include <unistd.h>
 
 #include "base/format.h"
 #include "platform/linux/files/descriptor.h"
@@ -21,30 +16,25 @@ bool succeeds(const std::string& command) {
 }
 
 /// A file system of 16 MiB with blocks of 1 KiB, in a file.
-class SmallDisk {
- public:
-  SmallDisk() : image_(folder_.root.path("/image")), mountPoint_(folder_.root.path("/disk")) {
-    std::filesystem::create_directory(mountPoint_);
-    isMounted_ = ::geteuid() == 0 && succeeds("truncate -s 16M " + image_) &&
-                 succeeds("mkfs.ext4 -q -b 1024 -m 0 " + image_) &&
-                 succeeds("mount -o loop " + image_ + " " + mountPoint_);
+struct SmallDisk {
+  SmallDisk() {
+    std::filesystem::create_directory(path);
+    isMounted = ::geteuid() == 0 && succeeds("truncate -s 16M " + image) &&
+                succeeds("mkfs.ext4 -q -b 1024 -m 0 " + image) &&
+                succeeds("mount -o loop " + image + " " + path);
   }
   ~SmallDisk() {
-    if (isMounted_) succeeds("umount " + mountPoint_);
+    if (isMounted) succeeds("umount " + path);
   }
   SmallDisk(const SmallDisk&) = delete;
   SmallDisk& operator=(const SmallDisk&) = delete;
 
-  bool isMounted() const { return isMounted_; }
-  std::string filler() const { return mountPoint_ + "/filler"; }
-  const std::string& path() const { return mountPoint_; }
-
   void leaveFree(std::int64_t kibibytes) const {
-    const Descriptor file(::open(filler().c_str(), O_WRONLY | O_CREAT, 0600));
+    const Descriptor file(::open(filler.c_str(), O_WRONLY | O_CREAT, 0600));
     std::int64_t size = 0;
     for (int attempt = 0; attempt < 8; ++attempt) {  // what the filler itself costs is seen by then
       struct statvfs status {};
-      ASSERT_EQ(::statvfs(mountPoint_.c_str(), &status), 0);
+      ASSERT_EQ(::statvfs(path.c_str(), &status), 0);
       const std::int64_t excess = static_cast<std::int64_t>(status.f_bavail) - kibibytes;
       if (excess == 0) return;
       size += excess * 1024;
@@ -53,11 +43,10 @@ class SmallDisk {
     }
   }
 
- private:
-  TemporaryRoot folder_;
-  std::string image_;
-  std::string mountPoint_;
-  bool isMounted_ = false;
+  const TemporaryRoot folder;
+  const std::string image = folder.root.path("/image"), path = folder.root.path("/disk");
+  const std::string filler = path + "/filler";
+  bool isMounted = false;
 };
 
 // At some of these sizes SQLite would write into a hole of its index and be killed by SIGBUS.
@@ -67,8 +56,8 @@ TEST(FullDiskTest, NoSignalEndsARunAndNothingIsLost) {
   for (const int free : {0, 4, 16, 36, 60, 77, 78, 79, 80, 81, 110, 150, 400}) {
     SCOPED_TRACE(format("%d KiB free", free));
     const SmallDisk disk;
-    if (!disk.isMounted()) GTEST_SKIP() << "needs root, mkfs.ext4 and loop devices";
-    const DeviceRoot root(disk.path());
+    if (!disk.isMounted) GTEST_SKIP() << "needs root, mkfs.ext4 and loop devices";
+    const DeviceRoot root(disk.path);
     const std::string queue = root.path("/var/lib/tavrel/ecc-events");
     std::filesystem::create_directories(queue);
     for (int i = 0; i < kEvents; ++i)
@@ -76,25 +65,20 @@ TEST(FullDiskTest, NoSignalEndsARunAndNothingIsLost) {
     std::filesystem::create_directories(root.path("/sys/devices/system/edac/mc"));
     disk.leaveFree(free);
 
-    const auto run = [&] {
-      return waitFor(forkProcess([&] {
-        ::setenv("TAVREL_ROOT", disk.path().c_str(), 1);
-        ::execl(TAVREL_BINARY, "tavrel", "-d", nullptr);
-      }));
-    };
+    const auto run = [&] { return waitFor(forkProcess([&] { executeBelow(disk.path, "-d"); })); };
     const auto scalars = [&root] {
       LinuxPlatform linuxPlatform(root);
       StatisticsStore& store = linuxPlatform.platform().statistics;
       int count = 0;
-      store.initWithDefaultPath()->scalarsForKeyPrefix(
-          "com.norvane.lumenhall.DiskUsage", 0, store.BHDaysSince1970(),
-          [&count](std::string_view, std::int32_t, std::int64_t, bool&) { ++count; });
+      store.initWithDefaultPath()->scalarsForKeyPrefix("com.norvane.lumenhall.DiskUsage", 0,
+                                                       store.BHDaysSince1970(),
+                                                       [&](auto, auto, auto, auto&) { ++count; });
       return count;
     };
     EXPECT_EQ(run(), 0);
     EXPECT_EQ(waitFor(forkProcess([&] { scalars(); })), 0) << "reading";
     if (std::filesystem::exists(LinuxPlatform(root).store().path() + "-kept")) ++kept;
-    std::filesystem::remove(disk.filler());
+    std::filesystem::remove(disk.filler);
     EXPECT_EQ(run(), 0);
     LinuxPlatform(root).platform().statistics->BHClientCheckpoint();  // as the next day's run does
     EXPECT_EQ(scalars(), 2);

@@ -1,0 +1,49 @@
+// A device root with the services over which most others are built.
+#pragma once
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "base/text.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/plist/coding.h"
+#include "temporary_root.h"
+
+namespace tavrel {
+
+/// Stands still: 2026-11-27 18:02:18.25 UTC until it is set.
+class FixedClock final : public Clock {
+ public:
+  plist::Date now() override { return time; }
+  std::uint64_t ticks() override { return 0; }
+  std::optional<TimeBase> timeBase() override { return TimeBase{1, 1}; }
+
+  plist::Date time = plist::Date::since1970(1'795'802'538.25);
+};
+
+/// Where no power goes, flushing only costs time.
+class QuickFileSystem final : public FileSystem {
+ protected:
+  int syncFile(int) override { return 0; }
+};
+
+/// The services of one process on a device.
+struct ProcessServices {
+  ProcessServices(const DeviceRoot& root, FileSystem& fileSystem)
+      : preferences(root, fileSystem, coding, clock, log) {}
+  explicit ProcessServices(const DeviceRoot& root) : ProcessServices(root, files) {}
+
+  KeptLog log;
+  QuickFileSystem files;
+  FixedClock clock;
+  plist::PlistCoding coding;
+  FilePreferences preferences;
+};
+
+struct DeviceServices : TemporaryRoot, ProcessServices {
+  DeviceServices() : ProcessServices(root) {}
+};
+
+}  // namespace tavrel
