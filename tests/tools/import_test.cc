@@ -143,7 +143,8 @@ TEST(StatList, KeepsColumnsOverAnyNumberOfRowsAndStopsAtThePrefix) {
 
 TEST(StatShow, SaysWhatAStatisticComesTo) {
   const TemporaryDevice device;
-  std::string lines = "scalar\t19999\tk\t-5\nscalar\t20001\tk\t7\nscalar\ttoday\tl\t1\n";
+  std::string lines =
+      "scalar\t3\tv\t1\nscalar\t19999\tk\t-5\nscalar\t20001\tk\t7\nscalar\ttoday\tl\t1\n";
   for (int i = 1; i <= 200; ++i)
     lines += format("value\t%d\tk\t1\t%d\n", i <= 100 ? 20000 : 20001, 101 - i);
   device.run("stat import", lines +
@@ -195,6 +196,8 @@ Histogram
   EXPECT_EQ(json["distribution"]["histogram"],
             R"([{"bucket": "-inf", "count": 1}, {"bucket": "[0.5, 0.5]", "count": 2}])"_json);
   EXPECT_EQ(device.run("stat show l --days 1").status, 0);
+  device.check("stat show v",
+               prints("Scalar v, 1 day\n\n  DAY             VALUE\n  3 (1970-01-04)      1\n"));
   device.check("stat show k --days 7",
                fails("no statistic k in the last 7 days: see 'tavrelctl stat list'"));
   device.check("stat show x", fails("no statistic x: see 'tavrelctl stat list'"));
@@ -277,7 +280,7 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
 
 // Takes two seconds between readings, and changes the machine meanwhile.
 struct SlowPace final : CollectPace {
-  explicit SlowPace(std::function<void()> change) : change(std::move(change)) {}
+  explicit SlowPace(std::function<void()> between) : change(std::move(between)) {}
   Ticks now() override { return time; }
   bool endsBefore(Ticks) override {
     time += std::chrono::seconds(2);

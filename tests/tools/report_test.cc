@@ -120,6 +120,9 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
   EXPECT_EQ(json["missing"], 0);
   const auto& channels = json["channels"];
   EXPECT_EQ(channels[0]["converted"], R"({"value": 332595200000.0, "unit": "bytes"})"_json);
+  EXPECT_EQ(channels[0]["timestamp"], 24000000000);
+  const auto change = device.json("report sample --group Temperature --delta --interval 0");
+  EXPECT_EQ(change["channels"][0].at("timestamp"), nullptr);
   EXPECT_EQ(channels[2]["buckets"][0]["sum"], nullptr);
   EXPECT_EQ(channels[2]["buckets"][5]["sum"], 9000);
   EXPECT_EQ(channels[3]["values"].dump(), "[3,0,7,1,0,2,null,null]");
