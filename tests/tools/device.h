@@ -5,10 +5,12 @@
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
+#include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
 #include <vector>
 
+#include "base/format.h"
 #include "platform/plist/xml.h"
 #include "tests/platform/temporary_root.h"
 #include "tools/shared/json_value.h"
@@ -16,8 +18,11 @@
 
 namespace tavrel {
 
+using namespace nlohmann::literals;
+
 inline constexpr const char* kWhitelistFile =
     "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
+inline const std::string kSubmission = "/var/mobile/Library/Logs/Submission/";
 
 /// A property list in its XML form, written here as JSON.
 inline std::string xmlOf(std::string_view json) {
@@ -48,6 +53,24 @@ inline Outcome fails(const std::string& error, int status = 1) {
   return {status, {}, "tavrelctl: " + error + "\n"};
 }
 
+/// The words of a command, also written as one text where none of them is empty or has spaces.
+struct CommandLine : std::vector<std::string> {
+  CommandLine(std::initializer_list<std::string> words) : vector(words) {}
+  CommandLine(std::vector<std::string> words) : vector(std::move(words)) {}
+  CommandLine(const std::string& text) {
+    std::istringstream words(text);
+    for (std::string word; words >> word;)
+      push_back(word);
+  }
+  CommandLine(const char* text) : CommandLine(std::string(text)) {}
+
+  CommandLine with(const std::string& word) const {
+    CommandLine longer = *this;
+    longer.push_back(word);
+    return longer;
+  }
+};
+
 class TemporaryDevice : public TemporaryRoot {
  public:
   std::string path(std::string_view devicePath) const { return root.path(devicePath); }
@@ -62,21 +85,41 @@ class TemporaryDevice : public TemporaryRoot {
     return list;
   }
 
-  Outcome run(std::vector<std::string> arguments, const std::string& input = {},
+  Outcome run(const CommandLine& command, const std::string& input = {},
               std::optional<std::size_t> columns = std::nullopt) const {
-    return runAt(path(""), std::move(arguments), input, columns);
+    return runAt(path(""), command, input, columns);
   }
 
-  static Outcome runAt(const std::string& root, std::vector<std::string> arguments,
-                       const std::string& input = {},
+  static Outcome runAt(const std::string& root, CommandLine command, const std::string& input = {},
                        std::optional<std::size_t> columns = std::nullopt) {
     std::istringstream in(input);
-    std::ostringstream out;
-    std::ostringstream error;
-    arguments.insert(arguments.begin(), {"--root", root});
+    std::ostringstream out, error;
+    command.insert(command.begin(), {"--root", root});
     const int status =
-        runTavrelctl(arguments, {.in = in, .out = out, .error = error, .columns = columns});
+        runTavrelctl(command, {.in = in, .out = out, .error = error, .columns = columns});
     return {status, out.str(), error.str()};
+  }
+
+  void check(const CommandLine& command, const Outcome& expected, const std::string& input = {},
+             std::optional<std::size_t> columns = std::nullopt) const {
+    EXPECT_EQ(run(command, input, columns), expected) << testing::PrintToString(command);
+  }
+
+  /// What a command prints with --json.
+  nlohmann::json json(const CommandLine& command, const std::string& input = {},
+                      int status = 0) const {
+    const Outcome outcome = run(command.with("--json"), input);
+    EXPECT_EQ(outcome.status, status) << outcome;
+    const auto json = nlohmann::json::parse(outcome.out, nullptr, false);
+    EXPECT_EQ(json.value("format_version", 0), 1) << outcome;
+    return json;
+  }
+
+  /// Files a log, with metadata, in a folder of submissions ("pending/NAME").
+  void fileLog(const std::string& name, std::string_view content,
+               const std::string& metadata) const {
+    write(kSubmission + name + ".log", content);
+    write(kSubmission + name + ".metadata.plist", xmlOf(metadata));
   }
 };
 

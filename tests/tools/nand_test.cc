@@ -1,9 +1,4 @@
 // tavrelctl nand: buffers in, figures out.
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
-
-#include "base/base64.h"
-#include "base/format.h"
 #include "device.h"
 
 namespace tavrel {
@@ -22,24 +17,15 @@ std::string words(std::initializer_list<std::uint32_t> list) {
 }
 
 std::string built(const TemporaryDevice& device, const std::string& entries) {
-  const Outcome outcome =
-      device.run({"nand", "build", "-", "-o", "-"}, R"({"entries": )" + entries + "}");
+  const Outcome outcome = device.run("nand build - -o -", R"({"entries": )" + entries + "}");
   EXPECT_EQ(outcome.status, 0) << outcome;
   return outcome.out;
-}
-
-nlohmann::ordered_json jsonOf(const Outcome& outcome) {
-  const auto json = nlohmann::ordered_json::parse(outcome.out, nullptr, false);
-  EXPECT_EQ(json.value("format_version", 0), 1) << outcome;
-  return json;
 }
 
 // A device whose driver answers with `statistics`.
 void record(const TemporaryDevice& device, const std::string& statistics) {
   const auto data = [](const std::string& bytes) {
-    std::string text = R"({"$data": ")";
-    appendBase64(text, asBytes(bytes));
-    return text + "\"}";
+    return jsonOf(plist::Data(asBytes(bytes))).dump();
   };
   device.write("/var/lib/tavrel/registry/storage.plist",
                xmlOf(R"({"Services": [{"Class": "ASPStorage", "Methods": [
@@ -59,7 +45,7 @@ constexpr const char* kStatistics = R"([
 TEST(NandInfo, GroupsWhatTheDriverAnswers) {
   const TemporaryDevice device;
   record(device, built(device, kStatistics));
-  EXPECT_EQ(device.run({"nand", "info"}), prints(R"(Device
+  device.check("nand info", prints(R"(Device
   ExportVersion  131075  0x20003
   DriverVersion      -1
 
@@ -89,48 +75,39 @@ ReadsBeforeErasure
 17 figures are 0; --all shows them
 )"));
 
-  const Outcome all = device.run({"nand", "info", "--all"});
+  const Outcome all = device.run("nand info --all");
   EXPECT_EQ(std::count(all.out.begin(), all.out.end(), '\n'), 42) << all;
   EXPECT_NE(all.out.find("\nBandsMaxTempHisto: 3 buckets, all 0\n"), std::string::npos) << all;
 
-  const auto json = jsonOf(device.run({"nand", "info", "--json"}));
+  const auto json = device.json("nand info");
   EXPECT_EQ(json.size(), 34U) << json;
-  EXPECT_EQ(json["derived"].dump(),
-            R"({"virtual_block_bytes":33554432,"capacity_bytes":34359738368,)"
-            R"("free_virtual_blocks_share":0.0908203125,"free_nodes_share":null,)"
-            R"("logical_read_bytes":null,"logical_write_bytes":4096000000,)"
-            R"("write_amplification":2.048,"formatted_from":null,"figures_at_zero":17})");
+  EXPECT_EQ(json["derived"]["logical_read_bytes"], nullptr);
+  EXPECT_EQ(json["derived"]["formatted_from"], nullptr);
   EXPECT_EQ(json["com.norvane.NANDInfo.NumLogicalReads"], -1);
   EXPECT_EQ(json["com.norvane.NANDInfo.BandsMaxTempHisto2"], 0);
 
   // An old buffer has the first figures only, and nothing to compute from.
   record(device, built(device, R"([["exportVersion", 131073]])"));
-  const Outcome old = device.run({"nand", "info"});
+  const Outcome old = device.run("nand info");
   EXPECT_EQ(old.status, 0) << old;
   EXPECT_EQ(old.out.find("amplification"), std::string::npos) << old;
-  EXPECT_EQ(jsonOf(device.run({"nand", "info", "--json"})).size(), 17U);
+  EXPECT_EQ(device.json("nand info").size(), 17U);
 }
 
 TEST(NandInfo, AFailureIsNoZero) {
   const TemporaryDevice device;
-  const std::string folder = device.path("/var/lib/tavrel/registry");
-  const auto failure = [&](const std::string& message) {
-    return "tavrelctl: no NAND information: " + message +
-           ": put a recording of the storage driver into " + folder + "\n";
-  };
-  EXPECT_EQ(device.run({"nand", "info"}),
-            (Outcome{1, "",
-                     "tavrelctl: Could not get matching Kernkit service for exporting classes\n" +
-                         failure("Unable to parse buffer")}));
+  device.check("nand info",
+               fails("Could not get matching Kernkit service for exporting classes\ntavrelctl: no "
+                     "NAND information: Unable to parse buffer: put a recording of the storage "
+                     "driver into " +
+                     device.path("/var/lib/tavrel/registry")));
   record(device, built(device, R"([["hostWrites", 1]])"));
-  const Outcome outcome = device.run({"nand", "info", "--json"});
-  EXPECT_EQ(outcome.error,
-            "tavrelctl: no NAND information: Unsupported export version: see what the driver "
-            "answers with 'tavrelctl registry show ID'\n");
-  EXPECT_EQ(outcome.status, 1);
-  EXPECT_EQ(jsonOf(outcome).dump(),
-            R"({"format_version":1,"com.norvane.NANDInfo.Error":"1",)"
-            R"("com.norvane.NANDInfo.ErrorMessage":"Unsupported export version"})");
+  device.check("nand info",
+               fails("no NAND information: Unsupported export version: see what the driver answers "
+                     "with 'tavrelctl registry show ID'"));
+  EXPECT_EQ(device.json("nand info", "", 1),
+            R"({"format_version": 1, "com.norvane.NANDInfo.Error": "1",
+                "com.norvane.NANDInfo.ErrorMessage": "Unsupported export version"})"_json);
 }
 
 TEST(NandParse, ReadsBackWhatWasBuilt) {
@@ -141,10 +118,8 @@ TEST(NandParse, ReadsBackWhatWasBuilt) {
   EXPECT_EQ(first, words({53,  1, 131075, 1, 4, 1, 1, 0, 4,   1, 0xFFFFFFFF, 0xFFFFFFFF,
                           265, 3, 1,      0, 2, 0, 3, 0, 54,  1, 9,          0,
                           21,  3, 5,      0, 5, 0, 5, 0, 184, 0}));
-  EXPECT_EQ(
-      device.run({"nand", "parse", "-"}, first),
-      (Outcome{
-          0, R"(STATISTIC                       VALUE
+  EXPECT_EQ(device.run("nand parse -", first),
+            (Outcome{0, R"(STATISTIC                       VALUE
 exportVersion              4295098371
 hostWrites                          1
 hostWrites       18446744073709551615
@@ -153,33 +128,33 @@ readCountHisto1                     2
 readCountHisto2                     3
 ECBins                              9
 )",
-          "tavrelctl: standard input: 2 records not wholly listed: of unknown statistics, without "
-          "values or with too many: --json prints them whole\n"}));
-  const Outcome parsed = device.run({"nand", "parse", "-", "--json"}, first + "\xab");
-  EXPECT_EQ(device.run({"nand", "build", "-", "-o", "-"}, parsed.out), prints(first + "\xab"));
-  EXPECT_EQ(jsonOf(parsed).dump(),
-            R"({"format_version":1,"result":1,"fields":{"exportVersion":131075,)"
-            R"("driverVersion":4294967295,"numVirtualBlocks":0,"blocksPerVirtualBlock":0,)"
-            R"("pagesPerVirtualBlock":0,"bytesPerPage":0,"hostReads":0,)"
-            R"("hostWrites":18446744073709551615,"numFreeVirtualBlocks":0,"wearLevMoves":0,)"
-            R"("nandReads":0,"nandWrites":0,"bandErases":0,"IND_pool_free":0,"IND_pool_count":0,)"
-            R"("utilFormatTime":0,"numSleepOps":0,"maxHighEnduranceBlockErases":0,)"
-            R"("readCountHisto":[1,2,3,0,0]},"entries":[["exportVersion",4295098371],)"
-            R"(["hostWrites",1],["hostWrites",18446744073709551615],["readCountHisto0",1],)"
-            R"(["readCountHisto1",2],["readCountHisto2",3],["ECBins",9],)"
-            R"({"key":21,"values":[5,5,5]},{"key":"TempSensorMax","values":[]},{"hex":"ab"}]})");
+                     "tavrelctl: standard input: 2 records not wholly listed: of unknown "
+                     "statistics, without values or with too many: --json prints them whole\n"}));
+  const Outcome parsed = device.run("nand parse - --json", first + "\xab");
+  EXPECT_EQ(device.run("nand build - -o -", parsed.out), prints(first + "\xab"));
+  EXPECT_EQ(nlohmann::json::parse(parsed.out), R"({"format_version": 1, "result": 1, "fields": {
+      "exportVersion": 131075, "driverVersion": 4294967295, "numVirtualBlocks": 0,
+      "blocksPerVirtualBlock": 0, "pagesPerVirtualBlock": 0, "bytesPerPage": 0, "hostReads": 0,
+      "hostWrites": 18446744073709551615, "numFreeVirtualBlocks": 0, "wearLevMoves": 0,
+      "nandReads": 0, "nandWrites": 0, "bandErases": 0, "IND_pool_free": 0, "IND_pool_count": 0,
+      "utilFormatTime": 0, "numSleepOps": 0, "maxHighEnduranceBlockErases": 0,
+      "readCountHisto": [1, 2, 3, 0, 0]}, "entries": [["exportVersion", 4295098371],
+      ["hostWrites", 1], ["hostWrites", 18446744073709551615], ["readCountHisto0", 1],
+      ["readCountHisto1", 2], ["readCountHisto2", 3], ["ECBins", 9], {"key": 21, "values": [5, 5, 5]},
+      {"key": "TempSensorMax", "values": []}, {"hex": "ab"}]})"_json);
 }
 
 TEST(NandParse, SaysWhereABufferIsBroken) {
   const TemporaryDevice device;
   const auto parse = [&](const std::string& entries, std::size_t recorded,
                          const std::string& error) {
-    const Outcome outcome = device.run({"nand", "parse", "-", "--json"}, built(device, entries));
-    EXPECT_EQ(outcome.error, "tavrelctl: standard input is no whole statistics buffer: " + error +
-                                 ": fetch or build it anew\n");
-    EXPECT_EQ(outcome.status, 1);
-    EXPECT_EQ(jsonOf(outcome)["result"], 0);
-    EXPECT_EQ(jsonOf(outcome)["entries"].size(), recorded);
+    const std::string buffer = built(device, entries);
+    EXPECT_EQ(device.run("nand parse -", buffer).error,
+              "tavrelctl: standard input is no whole statistics buffer: " + error +
+                  ": fetch or build it anew\n");
+    const auto json = device.json("nand parse -", buffer, 1);
+    EXPECT_EQ(json["result"], 0);
+    EXPECT_EQ(json["entries"].size(), recorded);
   };
   const std::string good = R"([["hostWrites", 1], )";
   const std::string second = "the record at byte 16: ";
@@ -189,11 +164,10 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
         second + "0x30000001 is above 0x30000000, the largest number of a statistic");
   parse(good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])", 1,
         second + "statistic 54 has 4294967295 values, but there is room for 1");
-  EXPECT_EQ(device.run({"nand", "parse", "-"}, built(device, good + "[805306368, []]]")).error,
+  EXPECT_EQ(device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
             "tavrelctl: standard input: 1 record not wholly listed: of unknown statistics, without "
-            "values or "
-            "with too many: --json prints them whole\n");
-  EXPECT_EQ(device.run({"nand", "parse", "-"}, words({4, 1, 1, 0, 0})),
+            "values or with too many: --json prints them whole\n");
+  EXPECT_EQ(device.run("nand parse -", words({4, 1, 1, 0, 0})),
             (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
                      "tavrelctl: standard input: the last 4 bytes are no whole unit of 8 and were "
                      "passed over\n"}));
@@ -205,10 +179,8 @@ TEST(NandParse, DifferencesPairEqualNamesInTheirOrder) {
       ["hostReads", 9], ["ECBins", [1, 2]], ["shutdowns", 0]])"));
   device.write("/b", built(device, R"([["hostReads", 4], ["hostWrites", 1], ["numSleepOps", 3],
       ["boots", 5], ["hostWrites", 7], ["ECBins", [1]], ["shutdowns", 18446744073709551615]])"));
-  const std::vector<std::string> command = {"nand", "parse", device.path("/a"), "--diff",
-                                            device.path("/b")};
-  EXPECT_EQ(device.run(command),
-            prints(R"(STATISTIC    BEFORE                 AFTER                 CHANGE
+  const CommandLine command = "nand parse " + device.path("/a") + " --diff " + device.path("/b");
+  device.check(command, prints(R"(STATISTIC    BEFORE                 AFTER                 CHANGE
 hostWrites        2                     7                     +5
 hostReads         9                     4                     -5
 ECBins0           1                     -
@@ -217,16 +189,11 @@ shutdowns         0  18446744073709551615  +18446744073709551615
 numSleepOps       -                     3
 ECBins            -                     1
 )"));
-  auto asJson = command;
-  asJson.push_back("--json");
-  const auto json = jsonOf(device.run(asJson));
+  const auto json = device.json(command);
   EXPECT_EQ(json["results"].dump(), "[1,1]");
-  EXPECT_EQ(json["differences"].size(), 7U);
-  EXPECT_EQ(json["differences"][1].dump(),
-            R"({"statistic":"hostReads","before":9,"after":4,"change":-5})");
   EXPECT_EQ(json["differences"][4].dump(),
-            R"({"statistic":"shutdowns","before":0,"after":18446744073709551615,"change":null})");
-  EXPECT_EQ(device.run({"nand", "parse", device.path("/a"), "--diff", device.path("/a")}),
+            R"({"after":18446744073709551615,"before":0,"change":null,"statistic":"shutdowns"})");
+  EXPECT_EQ(device.run("nand parse " + device.path("/a") + " --diff " + device.path("/a")),
             prints("no differences among the statistics that have a name\n"));
 }
 
@@ -239,8 +206,8 @@ TEST(NandBuild, NamesThePlaceOfAMistake) {
         R"([["ECBins0", 1], ["boots", 1], ["ECBins1", 1]])", R"([{"key": 1, "sum": 2}])",
         R"([{"key": 1, "count": 4294967296}])", R"([{"key": 1, "values": 2}])",
         R"([{"hex": "012"}])", "[7]"}) {
-    const Outcome outcome = device.run({"nand", "build", "-", "-o", device.path("/out")},
-                                       R"({"entries": )" + entries + "}");
+    const Outcome outcome =
+        device.run("nand build - -o " + device.path("/out"), R"({"entries": )" + entries + "}");
     EXPECT_EQ(outcome.status, 1) << outcome;
     errors += outcome.error.substr(27);
   }
@@ -257,7 +224,7 @@ entries[0]: "values": 2 is no list
 entries[0]: "hex": "012": give pairs of hexadecimal digits
 entries[0]: 7 is no entry: give [statistic, value], {"key": …, "values": […]} or {"hex": …}
 )");
-  EXPECT_EQ(device.run({"nand", "build", "-", "-o", device.path("/out")}, "[]"),
+  EXPECT_EQ(device.run("nand build - -o " + device.path("/out"), "[]"),
             fails("standard input: no list of entries: give an object with \"entries\": […]"));
   EXPECT_FALSE(std::filesystem::exists(device.path("/out")));
 }
@@ -268,23 +235,20 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
   for (std::uint32_t i = 0; i < 1024; ++i)
     block += words({i});
   const auto counters = [&](const char* chip, const char* maker, const std::string& error) {
-    const Outcome outcome = device.run(
-        {"nand", "counters", "-", "--chip-id", chip, "--manufacturer-id", maker, "--json"}, block);
-    EXPECT_EQ(outcome.status, 0) << outcome;
-    EXPECT_EQ(outcome.error, error);
-    const auto json = jsonOf(outcome);
+    const CommandLine command{"nand", "counters",          "-",  "--chip-id",
+                              chip,   "--manufacturer-id", maker};
+    EXPECT_EQ(device.run(command, block).error, error);
+    const auto json = device.json(command, block);
     EXPECT_EQ(json["counters"].size(), 11U);
-    EXPECT_EQ(json["counters"].back().size(), 12U);
-    return format("%s %d", json["parser"].get<std::string>(),
-                  json["counters"]["readStage"][0].get<int>());
+    EXPECT_EQ(json["counters"]["retentionIndication"].size(), 12U);
+    return json["parser"].get<std::string>() + ' ' + json["counters"]["readStage"][0].dump();
   };
   EXPECT_EQ(counters("K3V", "4582603A5700", ""), "parseCountersAlgoGeneric 0");
   EXPECT_EQ(counters("", "AGAD\x01",
                      "tavrelctl: unrecognized hex character: g\n"
                      "tavrelctl: unrecognized hex character: \\x01\n"),
             "parseCounters1y 256");
-  const Outcome text =
-      device.run({"nand", "counters", "-", "--chip-id", "K4V", "--manufacturer-id", "0"}, block);
+  const Outcome text = device.run("nand counters - --chip-id K4V --manufacturer-id 0", block);
   for (const char* part :
        {"Parser  parseCountersAlgoGenericK4\n\nreadStage (33)\n   0:    0    1    2    3",
         "\n  32:  110\n", "\nalgoNANDAccessesBin (8): all 0\n",
@@ -292,8 +256,7 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
         "\nretentionIndication (12)\n  0:  0  0  75  76"}) {
     EXPECT_NE(text.out.find(part), std::string::npos) << part << text;
   }
-  EXPECT_EQ(device.run({"nand", "counters", "-", "--chip-id", "K4V", "--manufacturer-id", "0"},
-                       block + "x"),
+  EXPECT_EQ(device.run("nand counters - --chip-id K4V --manufacturer-id 0", block + "x"),
             fails("standard input is no counter block: it has 4097 bytes, and a block has 4096: "
                   "cut one out with dd bs=4096 count=1 skip=CHANNEL"));
 }
@@ -301,8 +264,7 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
 // A descriptor of version 6 with one field of kind 0.
 std::string descriptor(std::uint32_t count, const std::string& fieldFormat) {
   std::string bytes =
-      words({0, 6, 4, count, 0, 0, 36, 0}) + std::string("%s\n\0", 4) + words({1, 0, 0, 0, 0});
-  bytes += fieldFormat;
+      words({0, 6, 4, count, 0, 0, 36, 0}) + "%s\n\0"s + words({1, 0, 0, 0, 0}) + fieldFormat;
   bytes.resize(36 + 8 + 28);
   return bytes;
 }
@@ -312,20 +274,18 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   std::string records(3000 * 252, '\0');
   for (std::size_t at = 0; at < records.size(); at += 252)
     records[at] = 1;
-  const Outcome fixed = device.run({"nand", "snapshot", "-"}, records);
-  EXPECT_EQ(fixed.status, 0);
+  const Outcome fixed = device.run("nand snapshot -", records);
   EXPECT_TRUE(fixed.out.starts_with("Key: \nT   - Timestamp\n"));
   EXPECT_EQ(std::count(fixed.out.begin(), fixed.out.end(), '='), 26 * 3000);
   EXPECT_TRUE(fixed.out.ends_with("\n\n"));
 
   // A text far longer than its records.
   device.write("/wide", descriptor(3, "%4096u|"));
-  const std::vector<std::string> command = {"nand", "snapshot", "-", "--descriptor",
-                                            device.path("/wide")};
-  const std::string wide = std::string(4095, ' ');
-  EXPECT_EQ(device.run(command, words({7, 0, 8})), prints("%s\n" + wide + "7|\n" + wide + "8|\n"));
+  const CommandLine command = "nand snapshot - --descriptor " + device.path("/wide");
+  const std::string wide(4095, ' ');
+  device.check(command, prints("%s\n" + wide + "7|\n" + wide + "8|\n"), words({7, 0, 8}));
 
-  EXPECT_EQ(device.run({"nand", "snapshot", "-"}, std::string(100, 'x')),
+  EXPECT_EQ(device.run("nand snapshot -", std::string(100, 'x')),
             fails("standard input holds no whole record: it has 100 bytes, and a record has 252: "
                   "give a timeline of the controller, and --descriptor if one came with it"));
   EXPECT_EQ(device.run(command, words({7, 0})),
@@ -339,27 +299,27 @@ TEST(NandFreezer, TakesAFileOrTheDevicesSnapshot) {
       words({0x13, 4, 1, 0, 0, 0x909, 12, 0, 0}) + "VM_swapout\0\0"s +
       words({0x901, 32, 0, 0, 0, 0, 0, 0, 0, 0, 0xFFFFFFFF, 0xFFFFFFFF, 0x14, 0, 1, 0});
   const Outcome shown = prints("Traffic\n  VMFreezer.NumPhysicalWrites  18446744073709551615\n");
-  EXPECT_EQ(device.run({"nand", "freezer", "-"}, found), shown);
+  EXPECT_EQ(device.run("nand freezer -", found), shown);
 
   const std::string path = "/var/lib/tavrel/registry/stack-snapshot.bin";
-  const Outcome none = device.run({"nand", "freezer", "--json"});
-  EXPECT_EQ(none.status, 1);
-  EXPECT_EQ(jsonOf(none).dump(),
-            R"({"format_version":1,"com.norvane.NANDInfo.VMFreezer.Error":"1",)"
-            R"("com.norvane.NANDInfo.VMFreezer.ErrorMessage":)"
-            R"("Unable parse snapshot for VMFreezer NAND writes."})");
-  EXPECT_EQ(none.error,
-            "tavrelctl: no freezer writes: Unable parse snapshot for VMFreezer NAND writes: put a "
-            "stack snapshot that holds the thread VM_swapout at " +
-                device.path(path) + "\n");
+  const std::string reason = "Unable parse snapshot for VMFreezer NAND writes";
+  const std::string key = "com.norvane.NANDInfo.VMFreezer.";
+  EXPECT_EQ(
+      device.json("nand freezer", "", 1),
+      nlohmann::json(
+          {{"format_version", 1}, {key + "Error", "1"}, {key + "ErrorMessage", reason + "."}}));
+  device.check("nand freezer", fails("no freezer writes: " + reason +
+                                     ": put a stack snapshot that holds the "
+                                     "thread VM_swapout at " +
+                                     device.path(path)));
   device.write(path, found);
-  EXPECT_EQ(device.run({"nand", "freezer"}), shown);
-  EXPECT_EQ(jsonOf(device.run({"nand", "freezer", "--json"})).dump(),
-            R"({"format_version":1,)"
-            R"("com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites":18446744073709551615})");
-  EXPECT_EQ(device.run({"nand", "freezer", "-"}, found.substr(0, 40)),
-            fails("standard input: Unable parse snapshot for VMFreezer NAND writes: give a stack "
-                  "snapshot whose first container holds the thread VM_swapout"));
+  device.check("nand freezer", shown);
+  EXPECT_EQ(device.json("nand freezer")[key + "NumPhysicalWrites"].dump(), "18446744073709551615");
+  device.check("nand freezer -",
+               fails("standard input: " + reason +
+                     ": give a stack snapshot whose first container "
+                     "holds the thread VM_swapout"),
+               found.substr(0, 40));
 }
 
 }  // namespace

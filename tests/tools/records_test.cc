@@ -1,15 +1,15 @@
 // tavrelctl records and nandlog.
 #include <csignal>
 #include <functional>
-#include <nlohmann/json.hpp>
 #include <unistd.h>
 
-#include "base/format.h"
 #include "device.h"
 #include "tools/records/record_reader.h"
 
 namespace tavrel {
 namespace {
+
+using namespace std::string_literals;
 
 const std::string kRecords = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
 
@@ -24,58 +24,51 @@ const std::string kTelemetryLine =
 
 TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
   const TemporaryDevice device;
-  EXPECT_EQ(device.run({"records", "list"}), prints("no records\n"));
-  EXPECT_EQ(device.run({"records", "show"}), prints("no records\n"));
-  EXPECT_EQ(device.run({"records", "show", "--json"}).out,
-            "{\n  \"format_version\": 1,\n  \"records\": []\n}\n");
-
-  const std::string hostile[] = {"{\"time\":1}", "\xff", std::string(5000, '['),
-                                 std::string(3, '\0'), R"({"time":"x","type":172,"record":{"a":)"};
-  std::string ecc = kEccLine;
-  for (const std::string& line : hostile)
-    ecc += line + (line.ends_with(':') ? "" : "\n");
-  device.write(kRecords + "172-2026-11-27.jsonl", ecc);
+  device.check("records list", prints("no records\n"));
+  device.check("records show", prints("no records\n"));
+  EXPECT_EQ(device.json("records show")["records"].dump(), "[]");
+  device.write(kRecords + "172-2026-11-27.jsonl", kEccLine + "{\"time\":1}\n\xff\n" +
+                                                      std::string(5000, '[') + "\n\0\0\0\n"s +
+                                                      R"({"time":"x","type":172,"record":{"a":)");
   device.write(kRecords + "176-2026-11-27.jsonl", kTelemetryLine + "\n");
   device.write(kRecords + "176-2026-11-02.jsonl",
                recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}"));
   device.write(kRecords + "notes.txt", kEccLine);
   device.write(kRecords + "4294967296-2026-11-27.jsonl", kEccLine);
 
-  const std::string torn = "tavrelctl: 2 lines of " + device.path(kRecords) +
-                           "172-2026-11-27.jsonl left out, torn by a kill or a power cut; the "
-                           "first is line 5\n";
-  EXPECT_EQ(device.run({"records", "list"}),
-            (Outcome{1,
-                     "TYPE  DAY                 RECORDS       SIZE\n"
-                     " 176  20759 (2026-11-02)        1   76 bytes\n"
-                     " 172  20784 (2026-11-27)        4    5.0 KiB\n"
-                     " 176  20784 (2026-11-27)        1  104 bytes\n",
-                     torn}));
-  const Outcome all = device.run({"records", "show"});
-  EXPECT_EQ(all.status, 1);
-  EXPECT_EQ(all.out,
-            "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
-            "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
-            "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n");
-  EXPECT_EQ(all.error,
-            torn + "tavrelctl: 3 lines passed over, no record; the first is line 2 of " +
-                device.path(kRecords) +
-                "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n");
-  EXPECT_EQ(device.run({"records", "show", "--day", "2026-11-02"}).out,
+  const std::string torn =
+      "tavrelctl: 2 lines of " + device.path(kRecords) +
+      "172-2026-11-27.jsonl left out, torn by a kill or a power cut; the first is line 5\n";
+  device.check("records list", (Outcome{1,
+                                        "TYPE  DAY                 RECORDS       SIZE\n"
+                                        " 176  20759 (2026-11-02)        1   76 bytes\n"
+                                        " 172  20784 (2026-11-27)        4    5.0 KiB\n"
+                                        " 176  20784 (2026-11-27)        1  104 bytes\n",
+                                        torn}));
+  const Outcome all = device.run("records show");
+  EXPECT_EQ(
+      all,
+      (Outcome{1,
+               "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
+               "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
+               "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n",
+               torn + "tavrelctl: 3 lines passed over, no record; the first is line 2 of " +
+                   device.path(kRecords) +
+                   "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n"}));
+  EXPECT_EQ(device.run("records show --day 2026-11-02").out,
             all.out.substr(0, all.out.find('\n') + 1));
-  EXPECT_EQ(device.run({"records", "show", "--type", "176", "--day", "20784"}, "", 48).out,
+  EXPECT_EQ(device.run("records show --type 176 --day 20784", "", 48).out,
             "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3…\n");
-  EXPECT_EQ(device.run({"records", "show", "--type", "172", "--json"}).out,
-            "{\n  \"format_version\": 1,\n  \"records\": [\n    " +
-                kEccLine.substr(0, kEccLine.size() - 1) + "\n  ]\n}\n");
-  EXPECT_EQ(device.run({"records", "show", "--day", "soon"}).status, 2);
+  EXPECT_EQ(device.json("records show --type 172", "", 1)["records"][0].dump(),
+            nlohmann::json::parse(kEccLine).dump());
+  EXPECT_EQ(device.run("records show --day soon").status, 2);
 
   std::filesystem::remove(device.path(kRecords) + "172-2026-11-27.jsonl");
   std::filesystem::create_directory(device.path(kRecords) + "172-2026-11-27.jsonl");
-  const Outcome partial = device.run({"records", "show", "--day", "20784"});
-  EXPECT_EQ(partial.out, "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n");
-  EXPECT_EQ(partial.status, 1);
-  EXPECT_EQ(std::count(partial.error.begin(), partial.error.end(), '\n'), 1) << partial;
+  device.check("records show --day 20784",
+               {1, "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n",
+                "tavrelctl: cannot read " + device.path(kRecords) +
+                    "172-2026-11-27.jsonl: it is no regular file\n"});
 }
 
 TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
@@ -100,15 +93,12 @@ TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
 }
 
 // Calls a hook whenever what was printed is flushed.
-class HookedBuffer final : public std::stringbuf {
- public:
-  std::function<void(const std::string& printed)> hook;
-
- protected:
+struct HookedBuffer final : std::stringbuf {
   int sync() override {
-    if (hook) hook(str());
+    hook(str());
     return 0;
   }
+  std::function<void(const std::string& printed)> hook;
 };
 
 TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
@@ -136,9 +126,9 @@ TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
     std::istringstream in;
     std::ostream out(&buffer);
     std::ostringstream error;
-    std::vector<std::string> arguments{"--root", device.path(""), "records", "show", "--follow"};
-    if (json) arguments.emplace_back("--json");
-    EXPECT_EQ(runTavrelctl(arguments, {.in = in, .out = out, .error = error}), 0);
+    const CommandLine command =
+        "--root " + device.path("") + " records show --follow" + (json ? " --json" : "");
+    EXPECT_EQ(runTavrelctl(command, {.in = in, .out = out, .error = error}), 0);
     EXPECT_EQ(error.str(), "");
     EXPECT_EQ(stage, 3);
     if (json) {
@@ -149,19 +139,16 @@ TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
 
 TEST(Nandlog, ShowsTheNewestLogAndWhenTheNextMayBeWritten) {
   const TemporaryDevice device;
-  const Outcome none = device.run({"nandlog", "show"});
-  EXPECT_EQ(none,
-            (Outcome{1, "Next log        the next run may write one; none was written so far\n",
-                     "tavrelctl: no NAND log waits or was sent on: one is written when the "
-                     "write amplification is high\n"}));
-
-  const std::string outbox = "/var/mobile/Library/Logs/Submission/outbox/";
+  device.check("nandlog show",
+               {1, "Next log        the next run may write one; none was written so far\n",
+                "tavrelctl: no NAND log waits or was sent on: one is written when the write "
+                "amplification is high\n"});
+  const std::string outbox = device.path(kSubmission) + "outbox/";
   const auto file = [&](const std::string& name, const char* type, const std::string& text) {
-    device.write(outbox + name + ".log", text);
-    device.write(outbox + name + ".metadata.plist",
-                 xmlOf(format(R"({"LogType": "%s", "LogName": "StorageStatus",
-                                  "Time": {"$date": "2026-11-1%s:00:00Z"}})",
-                              type, name)));
+    device.fileLog("outbox/" + name, text,
+                   format(R"({"LogType": "%s", "LogName": "StorageStatus",
+                              "Time": {"$date": "2026-11-1%s:00:00Z"}})",
+                          type, name));
   };
   file("6T18", "165",
        "System ID: 1-2\nOS Version: A: b\n\n2026-11-16 18:02:18 +0000 a b[211]: "
@@ -169,10 +156,9 @@ TEST(Nandlog, ShowsTheNewestLogAndWhenTheNextMayBeWritten) {
        "inf\n");
   file("6T17", "165", "older");
   file("7T18", "193", "other");
-  device.run({"prefs", "set", "com.norvane.zentrix.tavrel", "SSLastLoggedAt",
-              "2026-01-01T00:00:00Z", "--date"});
-  EXPECT_EQ(device.run({"nandlog", "show"}), prints("Log             " + device.path(outbox) +
-                                                    R"(6T18.log (outbox)
+  device.run("prefs set com.norvane.zentrix.tavrel SSLastLoggedAt 2026-01-01T00:00:00Z --date");
+  device.check("nandlog show", prints("Log             " + outbox +
+                                      R"(6T18.log (outbox)
 System ID       1-2
 OS Version      A: b
 Written by      a b[211]
@@ -192,45 +178,35 @@ Others (1)
 
 Next log        the next run may write one; the last was written 2026-01-01 00:00:00 +0000
 )"));
-  device.run({"prefs", "set", "com.norvane.zentrix.tavrel", "SSLastLoggedAt",
-              "2200-01-01T00:00:00Z", "--date"});
-  const Outcome json = device.run({"nandlog", "show", "--json"});
-  const auto document = nlohmann::json::parse(json.out, nullptr, false);
-  EXPECT_EQ(document["next"], nlohmann::json::parse(R"({
+  device.run("prefs set com.norvane.zentrix.tavrel SSLastLoggedAt 2200-01-01T00:00:00Z --date");
+  const auto document = device.json("nandlog show");
+  EXPECT_EQ(document["next"], R"({
       "last_logged": "2200-01-01T00:00:00Z", "last_is_in_future": true, "allowed_now": false,
-      "allowed_from": "2200-01-08T00:00:00Z"})"));
-  EXPECT_EQ(document["log"]["validity"], nlohmann::json::parse(R"({"ValidityList[0]": [12, -1]})"));
-  EXPECT_EQ(document["log"]["write_amplification"],
-            nlohmann::json::parse(R"({"UserWamp": 2.05, "IntermediateWamp": "inf"})"));
-  EXPECT_EQ(document["log"]["date"], "2026-11-16 18:02:18 +0000");
-
+      "allowed_from": "2200-01-08T00:00:00Z"})"_json);
+  EXPECT_EQ(document["log"]["validity"], R"({"ValidityList[0]": [12, -1]})"_json);
   // Without its metadata a log is known by its name.
-  device.write(outbox + "StorageStatus-9.log", "x");
-  std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
-  std::filesystem::permissions(device.path(outbox) + "StorageStatus-9.log",
-                               std::filesystem::perms::none);
+  const std::string named = outbox + "StorageStatus-9.log";
   for (const char* part : {"6T17", "6T18", "7T18"})
-    std::filesystem::remove(device.path(outbox) + part + ".log");
+    std::filesystem::remove(outbox + part + ".log");
+  device.write(kSubmission + "outbox/StorageStatus-9.log", "no log\n\nof the form");
+  device.check("nandlog show",
+               {1,
+                "Next log        not before 2200-01-08 00:00:00 +0000: the last is dated "
+                "2200-01-01 00:00:00 +0000, later than now; 'tavrelctl prefs delete "
+                "com.norvane.zentrix.tavrel SSLastLoggedAt' lets the next run write one\n",
+                "tavrelctl: not a NAND log: " + named +
+                    ": 'tavrelctl log show StorageStatus-9.log' shows it\n"});
+  std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
+  std::filesystem::permissions(named, std::filesystem::perms::none);
   const uid_t user = geteuid();
   if (user == 0) {
     ASSERT_EQ(seteuid(65534), 0);  // who may read anything sees no refusal
   }
-  const Outcome refused = device.run({"nandlog", "show"});
+  const Outcome refused = device.run("nandlog show");
   ASSERT_EQ(seteuid(user), 0);
   EXPECT_EQ(refused.status, 1);
-  EXPECT_NE(refused.error.find("cannot read " + device.path(outbox) +
-                               "StorageStatus-9.log: Permission denied"),
-            std::string::npos)
+  EXPECT_NE(refused.error.find("cannot read " + named + ": Permission denied"), std::string::npos)
       << refused;
-
-  file("8T18", "165", "no log\n\nof the form");
-  EXPECT_EQ(device.run({"nandlog", "show"}),
-            (Outcome{1,
-                     "Next log        not before 2200-01-08 00:00:00 +0000: the last is dated "
-                     "2200-01-01 00:00:00 +0000, later than now; 'tavrelctl prefs delete "
-                     "com.norvane.zentrix.tavrel SSLastLoggedAt' lets the next run write one\n",
-                     "tavrelctl: not a NAND log: " + device.path(outbox) +
-                         "8T18.log: 'tavrelctl log show 8T18.log' shows it\n"}));
 }
 
 }  // namespace

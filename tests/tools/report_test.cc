@@ -1,8 +1,4 @@
 // The example recording, looked at with the registry and report commands.
-#include <gtest/gtest.h>
-#include <nlohmann/json.hpp>
-
-#include "base/format.h"
 #include "device.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/coding.h"
@@ -12,7 +8,6 @@ namespace {
 
 using plist::Array;
 using plist::Dictionary;
-using plist::Value;
 
 constexpr const char* kRecording = "/var/lib/tavrel/registry/report.plist";
 
@@ -20,8 +15,7 @@ std::string example() {
   return contentOf(TAVREL_EXAMPLES "/registry/report.plist");
 }
 
-class ReportTest : public testing::Test {
- protected:
+struct ReportTest : testing::Test {
   ReportTest() { device.write(kRecording, example()); }
 
   Dictionary recording() const { return plist::read(asBytes(example()))->dictionary(); }
@@ -33,52 +27,41 @@ class ReportTest : public testing::Test {
 };
 
 TEST_F(ReportTest, ListsChannelsAsTreeAndTable) {
-  EXPECT_EQ(device.run({"report", "list"}),
-            prints(R"(CHANNEL                  FORMAT     UNIT      CATEGORIES  ELEMENTS  ID
+  device.check("report list --category 6",
+               prints(R"(CHANNEL                  FORMAT  UNIT      CATEGORIES  ELEMENTS  ID
 flash0 <id 0x100000201>
   NAND
-    Traffic
-      Host reads         simple     4KiB      0x0101             1  0x486f73745264
-      Host writes        simple     4KiB      0x0101             1  0x486f73745772
-    Latency
-      Read latency       histogram  us        0x0001             7  0x52644c6174
     Errors
-      Corrected per die  array      events    0x0004             2  0x456363446965
+      Corrected per die  array   events    0x0004             2  0x456363446965
   Power
-    Power state          state      24Mticks  0x0002             3  0x5077725374
+    Power state          state   24Mticks  0x0002             3  0x5077725374
   Temperature
-    Controller           simple     mC        0x0002             1  0x54656d7043746c
+    Controller           simple  mC        0x0002             1  0x54656d7043746c
 radio0 <id 0x100000202>
-  Packets
-    Receive
-      DATARe             simple     packets   0x0001             1  0x444154415265
-      CTRLRe             simple     packets   0x0001             1  0x4354524c5265
-    Transmit
-      DATATr             simple     packets   0x0001             1  0x444154415472
-      CTRLTr             simple     packets   0x0001             1  0x4354524c5472
   Resets
-    Since start          simple               0x0004             1  0x1
+    Since start          simple            0x0004             1  0x1
 )"));
-  EXPECT_EQ(device.run({"report", "list", "--flat", "--category", "4", "--group", "NAND"}),
-            prints("DRIVER                   GROUP  SUBGROUP  CHANNEL            FORMAT  UNIT    "
-                   "CATEGORIES  ELEMENTS  ID\n"
-                   "flash0 <id 0x100000201>  NAND   Errors    Corrected per die  array   events  "
-                   "0x0004             2  0x456363446965\n"));
-  const std::pair<std::vector<std::string>, std::string> kCases[] = {
-      {{"--subgroup", "Receive"}, "DATARe CTRLRe "},
-      {{"--group", "NAND", "--subgroup", "Receive"}, ""},
-      {{"--category", "0x6", "--driver", "flash0"}, "Corrected per die Power state Controller "},
-      {{"--unit", "4KiB"}, "Host reads Host writes "},
-      {{"--unit", "0x0100007980000018"}, "Power state "},
-      {{"--driver", "4294967810", "--format", "1", "--category", "4"}, "Since start "},
+  device.check(
+      "report list --flat --category 4 --group NAND",
+      prints("DRIVER                   GROUP  SUBGROUP  CHANNEL            FORMAT  UNIT    "
+             "CATEGORIES  ELEMENTS  ID\n"
+             "flash0 <id 0x100000201>  NAND   Errors    Corrected per die  array   events  "
+             "0x0004             2  0x456363446965\n"));
+  const std::pair<CommandLine, std::string> kCases[] = {
+      {"--subgroup Receive", "DATARe CTRLRe "},
+      {"--group NAND --subgroup Receive", ""},
+      {"--category 0x6 --driver flash0", "Corrected per die Power state Controller "},
+      {"--unit 4KiB", "Host reads Host writes "},
+      {"--unit 0x0100007980000018", "Power state "},
+      {"--driver 4294967810 --format 1 --category 4", "Since start "},
       {{"--driver", "radio0 <id 0x100000202>", "--format", "unknown"}, ""},
-      {{"--driver", "radio"}, ""},
-      {{"--format", "state"}, "Power state "}};
+      {"--driver radio", ""},
+      {"--format state", "Power state "}};
   for (const auto& [selection, names] : kCases) {
-    std::vector<std::string> arguments{"report", "list", "--json"};
-    arguments.insert(arguments.end(), selection.begin(), selection.end());
+    CommandLine command{"report", "list"};
+    command.insert(command.end(), selection.begin(), selection.end());
     std::string found;
-    const auto json = nlohmann::json::parse(device.run(arguments).out);
+    const auto json = device.json(command);
     for (const auto& channel : json["channels"])
       found += channel["name"].get<std::string>() + ' ';
     EXPECT_EQ(found, names) << selection[1];
@@ -86,8 +69,7 @@ radio0 <id 0x100000202>
 }
 
 TEST_F(ReportTest, SamplesAndSubtracts) {
-  EXPECT_EQ(device.run({"report", "sample", "--driver", "flash0"}),
-            prints(R"(flash0 <id 0x100000201>
+  device.check("report sample --driver flash0", prints(R"(flash0 <id 0x100000201>
   NAND
     Traffic
       Host reads   309.8 GiB
@@ -113,71 +95,52 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
   Temperature
     Controller  41.3 °C
 )"));
-  EXPECT_EQ(device.run({"report", "sample", "--category", "2", "--delta", "--count", "2",
-                        "--interval", "0"}),
-            prints(R"(Change 1 of 2
-flash0 <id 0x100000201>
+  device.check("report sample --group Power --delta --interval 0", prints(R"(flash0 <id 0x100000201>
   Power
     Power state (24Mticks)
       ACTV  20.0 %  ######                            200 ms  entered 4  current
       IDLE  80.0 %  #########################         800 ms  entered 3
       SLP    0.0 %                                       0 s  entered 0
-  Temperature
-    Controller  0.25 °C
-
-Change 2 of 2
-flash0 <id 0x100000201>
-  Power
-    Power state (24Mticks)
-      ACTV  30.0 %  #########                         300 ms  entered 5
-      IDLE  10.0 %  ###                               100 ms  entered 4
-      SLP   60.0 %  ###################               600 ms  entered 1  current
-  Temperature
-    Controller  -0.125 °C
 )"));
+  const std::string path = "flash0 <id 0x100000201>\n  Temperature\n    Controller  ";
+  device.check(
+      "report sample --group Temperature --delta --count 2 --interval 0",
+      prints("Change 1 of 2\n" + path + "0.25 °C\n\nChange 2 of 2\n" + path + "-0.125 °C\n"));
   // Whatever is printed piece by piece looks as if it had been printed at once.
-  for (const auto& [arguments, indent] : {std::pair(std::vector<std::string>{"list"}, 2),
-                                          {{"list", "--group", "none"}, 2},
-                                          {{"sample"}, 2},
-                                          {{"sample", "--delta", "--interval", "0"}, 2},
-                                          {{"sample", "--count", "2", "--interval", "0"}, -1}}) {
-    auto line = arguments;
-    line.insert(line.begin(), "report");
-    line.push_back("--json");
-    const std::string text = device.run(line).out;
+  for (const auto& [command, indent] : {std::pair("list", 2),
+                                        {"list --group none", 2},
+                                        {"sample", 2},
+                                        {"sample --delta --interval 0", 2},
+                                        {"sample --count 2 --interval 0", -1}}) {
+    const std::string text = device.run(format("report %s --json", std::string(command))).out;
     const std::string first = indent < 0 ? text.substr(0, text.find('\n') + 1) : text;
     EXPECT_EQ(first, Json::parse(first).dump(indent) + '\n');
   }
-  const auto json =
-      nlohmann::json::parse(device.run({"report", "sample", "--group", "NAND", "--json"}).out);
-  EXPECT_EQ(json["format_version"], 1);
+  const auto json = device.json("report sample --group NAND");
   EXPECT_EQ(json["missing"], 0);
   const auto& channels = json["channels"];
-  EXPECT_EQ(channels[0], nlohmann::json::parse(R"({
-    "driver": "flash0 <id 0x100000201>", "driver_id": 4294967809, "group": "NAND",
-    "subgroup": "Traffic", "name": "Host reads", "id": 79643515572836, "format": "simple",
-    "categories": 257, "elements": 1, "unit": 648672277969240068, "unit_label": "4KiB",
-    "timestamp": 24000000000, "value": 81200000,
-    "converted": {"value": 332595200000.0, "unit": "bytes"}})"));
-  EXPECT_EQ(channels[2]["buckets"][5], nlohmann::json::parse(R"({"lower": 32, "upper": 1000,
-    "hits": 40, "minimum": 60, "maximum": 900, "sum": 9000, "mean": 225.0})"));
-  EXPECT_TRUE(channels[2]["buckets"][0]["sum"].is_null());
-  EXPECT_EQ(channels[3]["values"], nlohmann::json::parse("[3, 0, 7, 1, 0, 2, null, null]"));
+  EXPECT_EQ(channels[0]["converted"], R"({"value": 332595200000.0, "unit": "bytes"})"_json);
+  EXPECT_EQ(channels[0]["timestamp"], 24000000000);
+  const auto change = device.json("report sample --group Temperature --delta --interval 0");
+  EXPECT_EQ(change["channels"][0].at("timestamp"), nullptr);
+  EXPECT_EQ(channels[2]["buckets"][0]["sum"], nullptr);
+  EXPECT_EQ(channels[2]["buckets"][5]["sum"], 9000);
+  EXPECT_EQ(channels[3]["values"].dump(), "[3,0,7,1,0,2,null,null]");
+}
+
+plist::Data element(std::initializer_list<std::uint64_t> words) {
+  std::vector<std::byte> bytes(64);
+  std::size_t at = 0;
+  for (const std::uint64_t word : words)
+    storeLittle64(bytes, 8 * at++, word);
+  return plist::Data(bytes);
 }
 
 TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
   // The counters of a state run backwards, over the end of 64 bits.
-  std::vector<std::byte> group(64);
   Array groups = Array::create();
-  for (const std::uint64_t count : {std::uint64_t{5}, ~std::uint64_t{0}}) {
-    storeLittle64(group, 0, 7);
-    storeLittle64(group, 8, 8);
-    storeLittle64(group, 16, 0x100000002);
-    storeLittle64(group, 32, 1);
-    storeLittle64(group, 40, count);
-    storeLittle64(group, 48, count);
-    groups.append(plist::Data(group));
-  }
+  for (const std::uint64_t count : {std::uint64_t{5}, ~std::uint64_t{0}})
+    groups.append(element({7, 8, 0x100000002, 0, 1, count, count}));
   const Dictionary recorded = parseJsonValue(R"({
       "Services": [{"Class": "A\u001b", "EntryID": 7, "Properties": {
         "IOReportLegendPublic": true, "IOReportLegend": [{"IOReportChannels": [[8, 4294967298]]}]}}],
@@ -185,53 +148,44 @@ TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
                                   ->dictionary();
   recorded.dictionary("Hub").array("Channels").at(0).dictionary().set("Elements", groups);
   play(recorded);
-  EXPECT_EQ(
-      device.run({"report", "sample", "--count", "2", "--interval", "0"}),
+  device.check(
+      "report sample --count 2 --interval 0",
       prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  " + std::string(46, '#') +
              "  5  entered 5\n\n"
              "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  ########  "
              "18446744073709551615  entered 18446744073709551615\n"));
-  const auto json = nlohmann::json::parse(
-      device.run({"report", "sample", "--delta", "--interval", "0", "--json"}).out);
-  EXPECT_EQ(json["channels"][0]["states"], nlohmann::json::parse(R"([{"id": 1, "name": null,
-    "in_transitions": -6, "residency": -6, "converted": null, "duty_cycle": 1.0,
-    "current": false}])"));
+  const auto json = device.json("report sample --delta --interval 0");
+  EXPECT_EQ(json["channels"][0]["states"], R"([{"id": 1, "name": null, "in_transitions": -6,
+      "residency": -6, "converted": null, "duty_cycle": 1.0, "current": false}])"_json);
 }
 
 TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
   const Dictionary recorded = recording();
-  std::vector<std::byte> unset(64);
-  storeLittle64(unset, 0, 0x100000201);
-  storeLittle64(unset, 8, 0x486F73745264);
-  storeLittle64(unset, 16, 0x100000001);
-  storeLittle64(unset, 32, std::uint64_t{1} << 63);
   recorded.dictionary("Hub")
       .array("Channels")
       .at(0)
       .dictionary()
-      .set("Elements", Array{plist::Data(unset)});
+      .set("Elements",
+           Array{element({0x100000201, 0x486F73745264, 0x100000001, 0, std::uint64_t{1} << 63})});
   play(recorded);
-  const Outcome outcome = device.run({"report", "sample", "--group", "NAND", "--category", "1",
-                                      "--delta", "--interval", "0", "--format", "simple"});
-  EXPECT_EQ(outcome.status, 0);
-  EXPECT_EQ(outcome.error,
-            "tavrelctl: 1 channel without a change that can be told, left out; the first is flash0 "
-            "<id 0x100000201> NAND Traffic Host reads: a value is not set, or their number "
-            "changed\n");
-  EXPECT_EQ(outcome.out.substr(0, outcome.out.find_last_of(' ')),
-            "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0");
+  device.check("report sample --group NAND --category 1 --delta --interval 0 --unit 4KiB",
+               {0, "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0 MiB\n",
+                "tavrelctl: 1 channel without a change that can be told, left out; the first is "
+                "flash0 <id 0x100000201> NAND Traffic Host reads: a value is not set, or their "
+                "number changed\n"});
 }
 
 TEST_F(ReportTest, DescribesInTheSystemsWords) {
-  EXPECT_EQ(device.run({"report", "describe", "--group", "Power"}),
-            prints("flash0 <id 0x100000201> Power state < 0x5077725374 (24Mticks) | G/g "
-                   "Power/(none) | cat 0x02 | format 0x02 | elts 3 >\n"
-                   "           Power state[    ACTV] = { # 900      1.200e+02 s / 12.0% }\n"
-                   "           Power state[    IDLE] = { # 950      7.000e+02 s / 70.0% }\n"
-                   "           Power state[     SLP] = { # 50       1.800e+02 s / 18.0% }\n"));
-  EXPECT_EQ(device.run({"report", "describe", "--channels", "--group", "Resets"}),
-            prints("radio0 <id 0x100000202> Since start < 0x1 ((null)) | G/g Resets/(none) | cat "
-                   "0x04 | format 0x01 | elts 1 >\n"));
+  device.check("report describe --group Power",
+               prints("flash0 <id 0x100000201> Power state < 0x5077725374 (24Mticks) | G/g "
+                      "Power/(none) | cat 0x02 | format 0x02 | elts 3 >\n"
+                      "           Power state[    ACTV] = { # 900      1.200e+02 s / 12.0% }\n"
+                      "           Power state[    IDLE] = { # 950      7.000e+02 s / 70.0% }\n"
+                      "           Power state[     SLP] = { # 50       1.800e+02 s / 18.0% }\n"));
+  device.check(
+      "report describe --channels --group Resets",
+      prints("radio0 <id 0x100000202> Since start < 0x1 ((null)) | G/g Resets/(none) | cat "
+             "0x04 | format 0x01 | elts 1 >\n"));
 }
 
 TEST_F(ReportTest, SaysWhatIsMissing) {
@@ -243,64 +197,57 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
   forgetful.dictionary("Hub").array("Channels").remove(0);
   const Dictionary badLegend = recording();
   badLegend.array("Services").at(2).dictionary().dictionary("Properties").set("IOReportLegend", 1);
-  const auto check = [&](const Dictionary& played, std::vector<std::string> arguments, int status,
-                         const std::string& error) {
+  const std::string subscribe = "cannot subscribe to the channels",
+                    what = ": see 'tavrelctl report list --help'";
+  const std::tuple<Dictionary, const char*, int, std::string> kCases[] = {
+      {noHub, "sample", 1,
+       subscribe + " (0xe00002f0): there is no hub: a recording in /var/lib/tavrel/registry must "
+                   "have a \"Hub\""},
+      {refusing, "describe", 1,
+       subscribe + ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
+                   "registry list' shows the drivers and the hub"},
+      {forgetful, "sample", 0, "1 channel without values: the hub does not know them"},
+      {badLegend, "list", 0,
+       "radio0 <id 0x100000202>: bad legend\ntavrelctl: such drivers are left out: 'tavrelctl "
+       "registry show ID' shows what they publish"},
+      {noHub, "sample --group None", 1,
+       "no such channel is published: 'tavrelctl report list' shows what there is"},
+      {noHub, "list --category 0x10000", 2,
+       "--category: not a number of at most 16 bits: 0x10000" + what},
+      {noHub, "list --format sample", 2,
+       "--format: not a format of report channels: sample" + what}};
+  for (const auto& [played, command, status, error] : kCases) {
     play(played);
-    arguments.insert(arguments.begin(), "report");
-    const Outcome outcome = device.run(arguments);
-    EXPECT_EQ(outcome.status, status) << outcome;
-    EXPECT_EQ(outcome.error, "tavrelctl: " + error + '\n');
+    const Outcome outcome = device.run(std::string("report ") + command);
+    EXPECT_EQ(outcome, (Outcome{status, outcome.out, "tavrelctl: " + error + '\n'}));
     EXPECT_EQ(outcome.out.empty(), status != 0) << outcome;
-  };
-  const std::string subscribe = "cannot subscribe to the channels";
-  check(noHub, {"sample"}, 1,
-        subscribe +
-            " (0xe00002f0): there is no hub: a recording in /var/lib/tavrel/registry must "
-            "have a \"Hub\"");
-  check(refusing, {"describe"}, 1,
-        subscribe +
-            ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
-            "registry list' shows the drivers and the hub");
-  check(forgetful, {"sample"}, 0, "1 channel without values: the hub does not know them");
-  check(badLegend, {"list"}, 0,
-        "radio0 <id 0x100000202>: bad legend\ntavrelctl: such drivers are left out: 'tavrelctl "
-        "registry show ID' shows what they publish");
-  check(noHub, {"sample", "--group", "None"}, 1,
-        "no such channel is published: 'tavrelctl report list' shows what there is");
-  const std::string help = ": see 'tavrelctl report list --help'";
-  check(noHub, {"list", "--category", "0x10000"}, 2,
-        "--category: not a number of at most 16 bits: 0x10000" + help);
-  check(noHub, {"list", "--format", "sample"}, 2,
-        "--format: not a format of report channels: sample" + help);
+  }
   std::filesystem::remove(device.path(kRecording));
-  EXPECT_EQ(device.run({"report", "list"}), prints("no channels\n"));
-  EXPECT_EQ(device.run({"registry", "list"}),
-            prints("no drivers: recordings of them belong in " +
-                   device.path("/var/lib/tavrel/registry") + "\n"));
+  device.check("report list", prints("no channels\n"));
+  device.check("registry list", prints("no drivers: recordings of them belong in " +
+                                       device.path("/var/lib/tavrel/registry") + "\n"));
 }
 
 TEST_F(ReportTest, RegistryListsShowsAndRecords) {
-  EXPECT_EQ(device.run({"registry", "list"}),
-            prints("        ID  CLASS                   NAME         PUBLIC  CHANNELS  METHODS\n"
-                   "4294967296  ExampleRoot             root         no             0        0\n"
-                   "4294967809  ExampleFlashController  flash0       yes            6        0\n"
-                   "4294967810  ExampleRadio            radio0       yes            5        0\n"
-                   "4294967811  ExampleSensor           sensor0      no             1        0\n"
-                   "4294967300  IOReportHub             IOReportHub  no             0        0\n"));
-  EXPECT_EQ(device.run({"registry", "show", "0x100000000"}),
-            prints("Class = \"ExampleRoot\"\nEntryID = 4294967296\nName = \"root\"\nParents = {}\n"
-                   "Properties:\n  model = \"Example board\"\n"));
-  const auto json = nlohmann::json::parse(device.run({"registry", "list", "--json"}).out);
-  EXPECT_EQ(json["services"][1], nlohmann::json::parse(R"({"id": 4294967809,
-    "class": "ExampleFlashController", "name": "flash0", "public": true, "channels": 6,
-    "methods": 0})"));
-  EXPECT_EQ(device.run({"registry", "show", "9"}),
-            fails("no service has entry id 9: 'tavrelctl registry list' shows what there is"));
-  EXPECT_EQ(device.run({"registry", "show", "flash0"}),
-            fails("not an entry id: flash0: give a 64-bit number, decimal or with 0x", 2));
+  device.check(
+      "registry list",
+      prints("        ID  CLASS                   NAME         PUBLIC  CHANNELS  METHODS\n"
+             "4294967296  ExampleRoot             root         no             0        0\n"
+             "4294967809  ExampleFlashController  flash0       yes            6        0\n"
+             "4294967810  ExampleRadio            radio0       yes            5        0\n"
+             "4294967811  ExampleSensor           sensor0      no             1        0\n"
+             "4294967300  IOReportHub             IOReportHub  no             0        0\n"));
+  device.check(
+      "registry show 0x100000000",
+      prints("Class = \"ExampleRoot\"\nEntryID = 4294967296\nName = \"root\"\nParents = {}\n"
+             "Properties:\n  model = \"Example board\"\n"));
+  device.check("registry show 9",
+               fails("no service has entry id 9: 'tavrelctl registry list' shows what there is"));
+  device.check("registry show flash0",
+               fails("not an entry id: flash0: give a 64-bit number, decimal or with 0x", 2));
 
-  EXPECT_EQ(device.run({"registry", "record", "-"}), prints(example()));
-  EXPECT_EQ(device.run({"registry", "record", device.path(kRecording)}).status, 0);
+  device.check("registry record -", prints(example()));
+  EXPECT_EQ(device.run("registry record " + device.path(kRecording)).status, 0);
   EXPECT_EQ(device.files()[0].second, example());
 }
 

@@ -1,12 +1,9 @@
 // The small parts of the tool: values as JSON, days, tables.
 #include <cmath>
-#include <gtest/gtest.h>
 #include <limits>
-#include <nlohmann/json.hpp>
-#include <sstream>
 
+#include "device.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/json_value.h"
 #include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
@@ -87,22 +84,24 @@ TEST(Days, AreNumbersOrDates) {
   EXPECT_EQ(*parseDay("yesterday", 20773), 20772);
 }
 
+std::string printed(const Table& table, std::optional<std::size_t> columns = std::nullopt,
+                    bool isColoured = false) {
+  std::ostringstream out;
+  table.print({out, columns, isColoured});
+  return out.str();
+}
+
 TEST(Table, AlignsAndCutsTheWidestColumn) {
   Table table({{"KEY"}, {"N", Table::Align::Right}}, 2);
   table.add({"ü", "1"});
   table.add({"a\x1b[31m\n\xff\xe2\x80\xae", "10"});
   table.add({"a long key indeed", "100"});
-  const auto print = [&](std::optional<std::size_t> columns) {
-    std::ostringstream out;
-    table.print({out, columns});
-    return out.str();
-  };
-  EXPECT_EQ(print(std::nullopt),
+  EXPECT_EQ(printed(table),
             "  KEY                            N\n"
             "  ü                              1\n"
             "  a\\x1b[31m\\n\\xff\\xe2\\x80\\xae   10\n"
             "  a long key indeed            100\n");
-  EXPECT_EQ(print(20),
+  EXPECT_EQ(printed(table, 20),
             "  KEY              N\n"
             "  ü                1\n"
             "  a\\x1b[31m\\n\\…   10\n"
@@ -110,8 +109,8 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
   // In a pipe nothing is cut, and a long cell pushes only its own row.
   const std::string longKey(100, 'k');
   table.add({longKey, "1"});
-  EXPECT_EQ(print(std::nullopt).substr(0, 55), "  KEY" + std::string(49, ' ') + "N");
-  EXPECT_TRUE(print(std::nullopt).ends_with("\n  " + longKey + "    1\n"));
+  EXPECT_EQ(printed(table).substr(0, 55), "  KEY" + std::string(49, ' ') + "N");
+  EXPECT_TRUE(printed(table).ends_with("\n  " + longKey + "    1\n"));
 }
 
 TEST(Table, BarsTakeTheColumnsThatAreLeft) {
@@ -120,77 +119,52 @@ TEST(Table, BarsTakeTheColumnsThatAreLeft) {
   table.add({"b", Table::Cell::bar(5, 10), "y"});
   table.add({"c", Table::Cell::bar(1, 1000), "z"});
   table.add({"d", Table::Cell::bar(0, 10), ""});
-  const auto print = [&](std::optional<std::size_t> columns) {
-    std::ostringstream out;
-    table.print({out, columns});
-    return out.str();
-  };
-  EXPECT_EQ(print(26),
+  EXPECT_EQ(printed(table, 26),
             "a  ####################  x\n"
             "b  ##########            y\n"
             "c  #                     z\n"
             "d\n");
-  EXPECT_EQ(print(std::nullopt).find('\n'), 80U);
-  EXPECT_EQ(print(9).find('\n'), 14U);  // at least eight
+  EXPECT_EQ(printed(table).find('\n'), 80U);
+  EXPECT_EQ(printed(table, 9).find('\n'), 14U);  // at least eight
 }
 
 TEST(Table, MarksWhatStandsOutOnATerminalWithColours) {
   Table table({{"KEY"}, {"N", Table::Align::Right}});
   table.add({{"errors", Emphasis::Alarm}, {"7", Emphasis::Alarm}});
   table.add({"fine", "10"});
-  const auto print = [&](bool isColoured) {
-    std::ostringstream out;
-    table.print({out, 80, isColoured});
-    return out.str();
-  };
-  EXPECT_EQ(print(false), "KEY      N\nerrors   7\nfine    10\n");
-  EXPECT_EQ(print(true),
+  EXPECT_EQ(printed(table, 80), "KEY      N\nerrors   7\nfine    10\n");
+  EXPECT_EQ(printed(table, 80, true),
             "\x1b[1mKEY\x1b[0m      \x1b[1mN\x1b[0m\n"
             "\x1b[1;31merrors\x1b[0m   \x1b[1;31m7\x1b[0m\n"
             "fine    10\n");
 }
 
 TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
-  for (const auto& [value, unit, text] : {std::tuple(41.25, "°C", "41.3 °C"),
-                                          {-0.125, "°C", "-0.125 °C"},
-                                          {0.0, "s", "0 s"},
-                                          {12345e-9, "s", "12.3 µs"},
-                                          {0.25, "s", "250 ms"},
-                                          {119.97, "s", "120 s"},
-                                          {123456.0, "s", "123456 s"},
-                                          {2.4e9, "Hz", "2.4 GHz"},
-                                          {1e-13, "F", "0.1 pF"}}) {
-    EXPECT_EQ(quantityText(value, unit), text);
-  }
-  for (const auto& [bytes, text] : {std::pair(0.0, "0 bytes"),
-                                    {1023.0, "1023 bytes"},
-                                    {1536.0, "1.5 KiB"},
-                                    {1048570.0, "1.0 MiB"},
-                                    {-2048.0, "-2.0 KiB"},
-                                    {0x1p63, "8.0 EiB"}}) {
-    EXPECT_EQ(sizeText(bytes), text);
-  }
+  std::string quantities, sizes;
+  for (const auto& [value, unit] :
+       {std::pair(41.25, "°C"), std::pair(-0.125, "°C"), std::pair(0.0, "s"),
+        std::pair(12345e-9, "s"), std::pair(0.25, "s"), std::pair(119.97, "s"),
+        std::pair(123456.0, "s"), std::pair(2.4e9, "Hz"), std::pair(1e-13, "F")})
+    quantities += quantityText(value, unit) + "; ";
+  EXPECT_EQ(quantities,
+            "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; ");
+  for (const double bytes : {0.0, 1023.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
+    sizes += sizeText(bytes) + "; ";
+  EXPECT_EQ(sizes, "0 bytes; 1023 bytes; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");
 }
 
 TEST(ValueText, ShowsTheKindOfAValue) {
+  const plist::Dictionary value{
+      {"b", plist::Array{true, 2.0, 2, -0.0, std::nan(""), plist::Data(asBytes("\xff"))}},
+      {"a\n", plist::Array::create()},
+      {"c", plist::Dictionary{{"d", "e\x1b"}, {"e", plist::Date::ofDay(0)}}}};
   std::ostringstream out;
-  printOutline(out, plist::Dictionary{{"b", plist::Array{true, 2.0, 2, -0.0, std::nan("")}},
-                                      {"a\n", plist::Array::create()},
-                                      {"c", plist::Dictionary{{"d", "e\x1b"}}}});
+  printOutline(out, value);
   EXPECT_EQ(out.str(),
-            "a\\n = []\n"
-            "b:\n"
-            "  [0] = true\n"
-            "  [1] = 2.0\n"
-            "  [2] = 2\n"
-            "  [3] = -0.0\n"
-            "  [4] = nan\n"
-            "c:\n"
-            "  d = \"e\\u001b\"\n");
-  EXPECT_EQ(inlineText(plist::Dictionary{
-                {"b", plist::Array{true, false, 2.0, plist::Data(asBytes("\xff"))}},
-                {"a\n", plist::Dictionary{{"c", plist::Date::ofDay(0)}}}}),
-            R"({"a\n": {"c": 1970-01-01 00:00:00 +0000}, "b": [true, false, 2.0, <ff>]})");
+            "a\\n = []\nb:\n  [0] = true\n  [1] = 2.0\n  [2] = 2\n  [3] = -0.0\n  [4] = nan\n"
+            "  [5] = <ff>\nc:\n  d = \"e\\u001b\"\n  e = 1970-01-01 00:00:00 +0000\n");
+  EXPECT_EQ(inlineText(value), R"({"a\n": [], "b": [true, 2.0, 2, -0.0, nan, <ff>], )"
+                               R"("c": {"d": "e\u001b", "e": 1970-01-01 00:00:00 +0000}})");
 }
 
 }  // namespace

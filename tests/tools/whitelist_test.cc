@@ -1,7 +1,5 @@
 // tavrelctl whitelist
 
-#include <nlohmann/json.hpp>
-
 #include "device.h"
 
 namespace tavrel {
@@ -9,41 +7,24 @@ namespace {
 
 // Groups of a file of ours stand in the order of their names, so the later name wins.
 constexpr std::string_view kGood = R"({
-  "Apps": {
-    "ScalarKeys": {"app.starts": {"sig_fig": 2, "bucket_interval": 10}, "app.raw": {}},
-    "DistributionKeys": {"app.load": {"intervals": [10, 20.5]}}
-  },
+  "Apps": {"ScalarKeys": {"app.starts": {"sig_fig": 2, "bucket_interval": 10}, "app.raw": {}},
+           "DistributionKeys": {"app.load": {"intervals": [10, 20.5]}}},
   "InternalTesting": {"ScalarKeys": {"app.secret": {}, "app.raw": {"sig_fig": 1}}},
-  "Radio": {
-    "ScalarKeyPrefixes": {"radio.": {"sig_fig": 1}},
-    "DistributionKeyPrefixes": {"radio.": {}}
-  }
-})";
+  "Radio": {"ScalarKeyPrefixes": {"radio.": {"sig_fig": 1}},
+            "DistributionKeyPrefixes": {"radio.": {}}}})";
 
 TEST(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
   const TemporaryDevice device;
   device.write(kWhitelistFile, xmlOf(R"({
-    "A": {
-      "Scalars": {},
-      "DistributionKeys": [],
-      "ScalarKeys": {
-        "both": {},
-        "number": 1,
+    "A": {"Scalars": {}, "DistributionKeys": [], "ScalarKeys": {"both": {}, "number": 1,
         "options": {"sigfig": 2, "intervals": [1], "sig_fig": -1, "bucket_interval": 0},
-        "types": {"sig_fig": "2", "bucket_interval": 2.5}
-      }
-    },
-    "B": {
-      "DistributionKeys": {
-        "d": {"sig_fig": 1, "intervals": 3},
-        "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5]}
-      },
+        "types": {"sig_fig": "2", "bucket_interval": 2.5}}},
+    "B": {"DistributionKeys": {"d": {"sig_fig": 1, "intervals": 3},
+                               "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5]}},
       "ScalarKeyPrefixes": {"p.": {}, "p.q.": {}, "p.q.r": {}, "p.s": {}, "": {}},
-      "ScalarKeys": {"both": {"sig_fig": 1}}
-    },
+      "ScalarKeys": {"both": {"sig_fig": 1}}},
     "C": {"ScalarKeys": {"both": {}}, "ScalarKeyPrefixes": {"p.": {}}},
-    "D": true
-  })"));
+    "D": true})"));
   const std::string expected =
       R"(A/DistributionKeys: is an array: a table is a dictionary from keys to options: ignored
 A/ScalarKeys/number: is an integer: options are a dictionary, an empty one to report the value unchanged: ignored
@@ -70,25 +51,22 @@ C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. 
 B/ScalarKeyPrefixes/p.q.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q.r for the keys that begin so
 C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s for the keys that begin so
 )";
-  EXPECT_EQ(device.run({"whitelist", "check"}), (Outcome{1, expected, ""}));
+  device.check("whitelist check", (Outcome{1, expected, ""}));
 }
 
 TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   const TemporaryDevice device;
   const std::string path = device.path(kWhitelistFile);
-  EXPECT_EQ(device.run({"whitelist", "check"}),
-            fails("cannot read " + path + ": No such file or directory"));
+  device.check("whitelist check", fails("cannot read " + path + ": No such file or directory"));
   device.write(kWhitelistFile, "<plist><dict>");
-  const Outcome malformed = device.run({"whitelist", "check"});
-  EXPECT_EQ(malformed.status, 1);
-  EXPECT_TRUE(malformed.error.starts_with("tavrelctl: " + path + ": XML property list, line 1"))
-      << malformed;
-  EXPECT_EQ(device.run({"whitelist", "check", "-"}, xmlOf("[]")),
+  device.check("whitelist check",
+               fails(path + ": XML property list, line 1, column 14: no element found"));
+  EXPECT_EQ(device.run("whitelist check -", xmlOf("[]")),
             (Outcome{1,
                      "standard input: is an array: a whitelist is a dictionary of groups: nothing "
                      "is reported\n",
                      ""}));
-  EXPECT_EQ(device.run({"whitelist", "check", "-"}, xmlOf("{}")),
+  EXPECT_EQ(device.run("whitelist check -", xmlOf("{}")),
             prints("standard input: nothing to mend (digest 06e68461460e3d5f71e4211e51eb944c)\n"));
 }
 
@@ -98,7 +76,7 @@ TEST(WhitelistCheck, ListsAThousandFindingsAndCountsTheRest) {
     json += "\"k" + std::to_string(i) + "\": 1,";
   json.back() = '}';
   const TemporaryDevice device;
-  const Outcome outcome = device.run({"whitelist", "check", "-"}, xmlOf(json + "}}"));
+  const Outcome outcome = device.run("whitelist check -", xmlOf(json + "}}"));
   EXPECT_EQ(outcome.status, 1);
   EXPECT_EQ(std::count(outcome.out.begin(), outcome.out.end(), '\n'), 1001);
   EXPECT_TRUE(outcome.out.ends_with("standard input: has 234 more findings\n"));
@@ -107,61 +85,56 @@ TEST(WhitelistCheck, ListsAThousandFindingsAndCountsTheRest) {
 TEST(WhitelistExplain, NamesTheRuleAndShowsWhatItDoes) {
   const TemporaryDevice device;
   device.write(kWhitelistFile, xmlOf(kGood));
-  const auto explain = [&](const std::string& key, const std::string& value) {
-    return device.run({"whitelist", "explain", key, "--value", value});
-  };
-  EXPECT_EQ(explain("app.starts", "12345"), prints("app.starts\n"
-                                                   "  scalar        group Apps, exact key\n"
-                                                   "                bucket_interval 10, sig_fig 2\n"
-                                                   "                12345 is reported as 12000\n"
-                                                   "  distribution  not reported\n"));
-  EXPECT_EQ(explain("app.load", "20.5"),
-            prints("app.load\n"
-                   "  scalar        not reported\n"
-                   "  distribution  group Apps, exact key\n"
-                   "                summary and histogram, intervals [10, 20.5]\n"
-                   "                20.5 is counted in (10, 20.5]\n"));
-  EXPECT_EQ(explain("radio.x", "-15.5"),
-            prints("radio.x\n"
-                   "  scalar        group Radio, prefix radio.\n"
-                   "                sig_fig 1\n"
-                   "                the value is no 64-bit integer, as scalars are\n"
-                   "  distribution  group Radio, prefix radio.\n"
-                   "                summary only\n"));
-  EXPECT_EQ(explain("app.raw", "-9223372036854775808"),
-            prints("app.raw\n"
-                   "  scalar        group Apps, exact key\n"
-                   "                reported unchanged\n"
-                   "                -9223372036854775808 is reported as -9223372036854775808\n"
-                   "                group InternalTesting would decide, but it is for internal "
-                   "devices\n"
-                   "  distribution  not reported\n"));
-  EXPECT_EQ(explain("app.raw", "many").status, 2);
+  const std::tuple<const char*, const char*, const char*> kCases[] = {
+      {"app.starts", "12345", R"(app.starts
+  scalar        group Apps, exact key
+                bucket_interval 10, sig_fig 2
+                12345 is reported as 12000
+  distribution  not reported
+)"},
+      {"app.load", "20.5", R"(app.load
+  scalar        not reported
+  distribution  group Apps, exact key
+                summary and histogram, intervals [10, 20.5]
+                20.5 is counted in (10, 20.5]
+)"},
+      {"radio.x", "-15.5", R"(radio.x
+  scalar        group Radio, prefix radio.
+                sig_fig 1
+                the value is no 64-bit integer, as scalars are
+  distribution  group Radio, prefix radio.
+                summary only
+)"},
+      {"app.raw", "-9223372036854775808", R"(app.raw
+  scalar        group Apps, exact key
+                reported unchanged
+                -9223372036854775808 is reported as -9223372036854775808
+                group InternalTesting would decide, but it is for internal devices
+  distribution  not reported
+)"}};
+  for (const auto& [key, value, text] : kCases)
+    device.check({"whitelist", "explain", key, "--value", value}, prints(text));
+  EXPECT_EQ(device.run("whitelist explain app.raw --value many").status, 2);
 }
 
 TEST(WhitelistExplain, FollowsTaskingAndInternalDevices) {
   const TemporaryDevice device;
   device.write(kWhitelistFile, xmlOf(kGood));
-  device.run({"prefs", "set", "com.norvane.da", "Radio", "false", "--bool"});
-  EXPECT_EQ(device.run({"whitelist", "explain", "radio.x"}),
-            prints("radio.x\n"
-                   "  scalar        not reported\n"
-                   "                group Radio would decide, but it is switched off by tasking\n"
-                   "  distribution  not reported\n"
-                   "                group Radio would decide, but it is switched off by "
-                   "tasking\n"));
-
+  device.run("prefs set com.norvane.da Radio false --bool");
+  device.check("whitelist explain radio.x", prints(R"(radio.x
+  scalar        not reported
+                group Radio would decide, but it is switched off by tasking
+  distribution  not reported
+                group Radio would decide, but it is switched off by tasking
+)"));
   device.write("/etc/tavrel/device-answers.plist", xmlOf(R"({"InternalBuild": true})"));
-  const Outcome outcome =
-      device.run({"whitelist", "explain", "app.raw", "other", "--value", "123", "--json"});
-  EXPECT_EQ(outcome.status, 0) << outcome;
-  const auto json = nlohmann::json::parse(outcome.out);
-  EXPECT_EQ(json["keys"][0]["scalar"], nlohmann::json::parse(R"({
+  const auto json = device.json("whitelist explain app.raw other --value 123");
+  EXPECT_EQ(json["keys"][0]["scalar"], R"({
       "reported": true, "rule": "exact", "group": "InternalTesting", "options": {"sig_fig": 1},
-      "value": 123, "reported_value": 100})"));
-  EXPECT_EQ(json["keys"][1]["scalar"], nlohmann::json::parse(R"({
+      "value": 123, "reported_value": 100})"_json);
+  EXPECT_EQ(json["keys"][1]["scalar"], R"({
       "reported": true, "rule": "internal", "options": {},
-      "value": 123, "reported_value": 123})"));
+      "value": 123, "reported_value": 123})"_json);
 }
 
 }  // namespace
