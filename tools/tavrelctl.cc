@@ -97,7 +97,7 @@ int runTavrelctl(const std::vector<std::string>& arguments, const ToolStreams& s
     context.fail(error.what());
   }
   streams.out.flush();
-  if (!streams.out) context.fail("cannot write standard output: free space or mend the pipe");
+  if (!streams.out) context.fail("cannot write standard output: free space or check the pipe");
   return context.exitStatus();
 }
 

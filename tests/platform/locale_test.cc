@@ -99,9 +99,10 @@ TEST_F(LocaleTest, ListsTheLanguagesOfTheSystem) {
 
   write("/etc/tavrel/languages", "# screens\nde\n\nzh_TW\nno language\n");
   EXPECT_EQ(locale.systemLanguages(), (Names{"de", "zh-TW"}));
-  EXPECT_EQ(log.lines, Names{root.path("/etc/tavrel/languages") +
-                             ": \"no language\" is no language; write one tag a line, such as de "
-                             "or pt-BR"});
+  EXPECT_EQ(log.lines,
+            Names{root.path("/etc/tavrel/languages") +
+                  ": \"no language\" is not a language; write one tag per line, such as de "
+                  "or pt-BR"});
 }
 
 }  // namespace

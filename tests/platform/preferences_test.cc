@@ -120,7 +120,7 @@ TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
   }
   ASSERT_EQ(process.log.lines.size(), 5U);
   EXPECT_EQ(process.log.lines[1],
-            "cannot set preference \"k\": \".hidden\" is no name of a domain; use 1 to 200 "
+            "cannot set preference \"k\": \".hidden\" is not the name of a domain; use 1 to 200 "
             "characters without slash, control character or a dot in front");
   EXPECT_TRUE(fs::is_empty(device.root.path("/")));
   for (const std::size_t excess : {0U, 1U}) {

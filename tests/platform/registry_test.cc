@@ -420,7 +420,7 @@ TEST_F(RegistryTest, TheHubRefusesWhatTheRecordingRefuses) {
   ASSERT_EQ(log.lines.size(), 9U);
   for (const auto& [line, text] :
        {std::pair(4U,
-                  "4 is left out: its \"Elements\" are no groups of it; give elements of 64 "
+                  "4 is left out: its \"Elements\" are not groups of it; give elements of 64 "
                   "bytes with its ids, the first with their number at offset 20"),
         std::pair(5U, "5 is left out: it has no \"DriverID\" or no \"ChannelID\"; give integers"),
         std::pair(7U,

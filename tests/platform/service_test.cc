@@ -140,7 +140,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
       {"garbage", {}, ""},
       {"", {noMessage.get()}, ""},
       {"", {}, "the packet is empty"},
-      {*plist::writeXml(plist::Array{1}), {}, "the message is no dictionary"},
+      {*plist::writeXml(plist::Array{1}), {}, "the message is not a dictionary"},
       {std::string(70'000, 'x'), {}, "the packet is larger than 65536 bytes"},
       {good, {sealed.get()}, "a packet that passes a memory file must be empty"},
       {"", {sealed.get(), sealed.get(), sealed.get()}, "not exactly one descriptor"},
@@ -262,7 +262,7 @@ TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
   EXPECT_EQ(drain(), 0) << "a look at the socket is no peer, for whom it would be started";
   listener.reset();
   std::filesystem::create_directory(socket);
-  EXPECT_TRUE(refusesToListen("the file there is no socket; remove it"));
+  EXPECT_TRUE(refusesToListen("the file there is not a socket; remove it"));
 }
 
 /// Runs in a process of its own whose descriptors 3 and 4 are `third` and `fourth`.
@@ -334,7 +334,7 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
     device.write("/run/tavrel/notifications/" + std::string(kNotification), damaged);
     log.lines.clear();
     notifications.post(kNotification);
-    EXPECT_TRUE(log.lines.size() == 1 && log.says("; counting begins anew at "));
+    EXPECT_TRUE(log.lines.size() == 1 && log.says("; counting restarts at "));
     EXPECT_GT(*notifications.count(kNotification), seen);
     seen = *notifications.tryPost(kNotification);
     EXPECT_EQ(*notifications.count(kNotification), seen);

@@ -432,8 +432,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
       if (damaged) {
         ASSERT_EQ(log.lines.size(), byReader ? log.lines.size() : 1U);
         EXPECT_EQ(log.lines[0], where() + reason + ": the file has to be set aside; it is now " +
-                                    aside +
-                                    " and a new store is begun: inspect or remove that file");
+                                    aside + " and a new store begins: inspect or remove that file");
         EXPECT_EQ(contentOf(aside), content);
       } else if (reason) {
         scalarsOfToday();

@@ -7,7 +7,8 @@ namespace {
 TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const TemporaryDevice device;
   const std::string kNoXmlText =
-      "cannot be stored: property lists hold no control characters and only UTF-8: give such bytes "
+      "cannot be stored: property lists contain no control characters and only UTF-8: give such "
+      "bytes "
       "as --plist '{\"$data\": \"BASE64\"}'";
   const std::pair<CommandLine, std::string> kCases[] = {
       {"", "A subcommand is required: see 'tavrelctl --help'"},
@@ -86,7 +87,7 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
     device.check(std::string("prefs ") + command,
                  fails("cannot read preferences " + device.path(bad) +
                        ": not a property list: it begins neither with \"bplist00\" nor with "
-                       "\"<\"; mend it, or the next write sets it aside"));
+                       "\"<\"; repair it, or the next write sets it aside"));
   }
   EXPECT_EQ(device.run("prefs set com.example.a flag " + std::string(9U << 20, 'x')).status, 1);
   device.check("prefs get com.example.a flag", prints("true\n"));
@@ -104,7 +105,8 @@ TEST(Plist, ConvertsBetweenAllForms) {
   device.check("plist show " + file, prints("a:\n  [0] = 1\n  [1] = 2.5\nb = true\n"));
   EXPECT_EQ(device.json("plist show " + file)["value"], nlohmann::json::parse(json));
   device.check("plist convert - -o /dev/null",
-               fails("cannot write /dev/null: it is no regular file: use -o - and redirect"), json);
+               fails("cannot write /dev/null: it is not a regular file: use -o - and redirect"),
+               json);
   device.check("plist convert - -o " + no + "/x",
                fails("cannot write " + no + "/x: " + no + ": No such file or directory"), json);
   EXPECT_FALSE(std::filesystem::exists(no));
@@ -307,10 +309,10 @@ line two
   const auto mistyped = device.json("log show")["log"];
   EXPECT_EQ(mistyped["distributions"]["a"]["minimum"], R"({"$real": "nan"})"_json);
   EXPECT_EQ(mistyped["faults"], R"([
-      "BHDistributions/b: is no summary of five numbers",
+      "BHDistributions/b: is not a summary of five numbers",
       "BHDistributionsHistogram/a/(1, 2]: is a string, not a number",
       "BHDistributionsHistogram/c: belongs to no summary in BHDistributions",
-      "BHOther: is no part of a tallied log",
+      "BHOther: is not part of a tallied log",
       "BHScalars: is a string, not a dictionary"])"_json);
   EXPECT_NE(device.run("log show")
                 .out.find("\nNot as a tallied log has it (5)\n  BHDistributions/b: is no"),

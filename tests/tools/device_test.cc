@@ -61,7 +61,7 @@ TEST(Send, ChecksApplicationsBeforeItSends) {
   const TemporaryDevice device;
   const std::vector<std::pair<std::string, std::string>> cases = {
       {"{}", "no array of applications"},
-      {"[1]", "element 0 is no dictionary"},
+      {"[1]", "element 0 is not a dictionary"},
       {R"([{"version": "1"}])", "application 0: \"bundle_id\" must be a string"},
       {R"([{"bundle_id": "a", "version": "1", "orbo_id": 1.5}])",
        "application 0: \"orbo_id\" must be an integer"},
@@ -155,12 +155,13 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
           {"Domain": "d", "Key": "k", "Value": 2}]})",
        {"TaskingID: must be a string, not an integer",
         "TaskingPayload[0]: must be a dictionary, not an integer",
-        "TaskingPayload[1]/Domain: is no name of a preference domain",
+        "TaskingPayload[1]/Domain: is not the name of a preference domain",
         "TaskingPayload[2]/value: has no meaning; a device knows Domain, Key, Value",
         "TaskingPayload[2]/Domain: is missing", "TaskingPayload[2]/Value: is missing",
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
-       {"TaskingPayload[0]: holds text that no preference can: property lists hold no control "
+       {"TaskingPayload[0]: contains text that preferences cannot store: property lists hold no "
+        "control "
         "characters and only UTF-8: give such bytes as data"}}};
   for (const auto& [document, findings] : cases) {
     std::string lines;

@@ -150,8 +150,8 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
                          const std::string& error) {
     const std::string buffer = built(device, entries);
     EXPECT_EQ(device.run("nand parse -", buffer).error,
-              "tavrelctl: standard input is no whole statistics buffer: " + error +
-                  ": fetch or build it anew\n");
+              "tavrelctl: standard input is not a complete statistics buffer: " + error +
+                  ": fetch or build it again\n");
     const auto json = device.json("nand parse -", buffer, 1);
     EXPECT_EQ(json["result"], 0);
     EXPECT_EQ(json["entries"].size(), recorded);
@@ -167,10 +167,11 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
   EXPECT_EQ(device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
             "tavrelctl: standard input: 1 record not wholly listed: of unknown statistics, without "
             "values or with too many: --json prints them whole\n");
-  EXPECT_EQ(device.run("nand parse -", words({4, 1, 1, 0, 0})),
-            (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
-                     "tavrelctl: standard input: the last 4 bytes are no whole unit of 8 and were "
-                     "passed over\n"}));
+  EXPECT_EQ(
+      device.run("nand parse -", words({4, 1, 1, 0, 0})),
+      (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
+               "tavrelctl: standard input: the last 4 bytes are less than a unit of 8 and were "
+               "passed over\n"}));
 }
 
 TEST(NandParse, DifferencesPairEqualNamesInTheirOrder) {
@@ -211,18 +212,18 @@ TEST(NandBuild, NamesThePlaceOfAMistake) {
     EXPECT_EQ(outcome.status, 1) << outcome;
     errors += outcome.error.substr(27);
   }
-  EXPECT_EQ(errors, R"("entrys" is no member of this form: records stand in "entries"
+  EXPECT_EQ(errors, R"("entrys" is not a member of this form: records belong in "entries"
 entries[1]: no statistic is named "bots": give the number of one that is not known
 entries[0]: 1 members: give a statistic and its value, or a list of its values
-entries[0]: -1 is no value: give an integer from 0 to 2^64 - 1
-entries[0]: 1.5 is no value: give an integer from 0 to 2^64 - 1
+entries[0]: -1 is not a value: give an integer from 0 to 2^64 - 1
+entries[0]: 1.5 is not a value: give an integer from 0 to 2^64 - 1
 entries[0]: 4294967296 names no statistic: give its name, or its number of at most 32 bits
 entries[2]: ECBins1 does not follow ECBins0: give the elements from 0 on, one after the other, or a list
-entries[0]: "sum" is no member of a record: it has key, count and values
-entries[0]: "count": 4294967296 is no integer from 0 to 2^32 - 1
+entries[0]: "sum" is not a member of a record: it has key, count and values
+entries[0]: "count": 4294967296 is not an integer from 0 to 2^32 - 1
 entries[0]: "values": 2 is no list
 entries[0]: "hex": "012": give pairs of hexadecimal digits
-entries[0]: 7 is no entry: give [statistic, value], {"key": …, "values": […]} or {"hex": …}
+entries[0]: 7 is not an entry: give [statistic, value], {"key": …, "values": […]} or {"hex": …}
 )");
   EXPECT_EQ(device.run("nand build - -o " + device.path("/out"), "[]"),
             fails("standard input: no list of entries: give an object with \"entries\": […]"));
@@ -257,7 +258,7 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
     EXPECT_NE(text.out.find(part), std::string::npos) << part << text;
   }
   EXPECT_EQ(device.run("nand counters - --chip-id K4V --manufacturer-id 0", block + "x"),
-            fails("standard input is no counter block: it has 4097 bytes, and a block has 4096: "
+            fails("standard input is not a counter block: it has 4097 bytes, and a block has 4096: "
                   "cut one out with dd bs=4096 count=1 skip=CHANNEL"));
 }
 
@@ -286,7 +287,7 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   device.check(command, prints("%s\n" + wide + "7|\n" + wide + "8|\n"), words({7, 0, 8}));
 
   EXPECT_EQ(device.run("nand snapshot -", std::string(100, 'x')),
-            fails("standard input holds no whole record: it has 100 bytes, and a record has 252: "
+            fails("standard input has no complete record: it has 100 bytes, and a record has 252: "
                   "give a timeline of the controller, and --descriptor if one came with it"));
   EXPECT_EQ(device.run(command, words({7, 0})),
             fails("cannot render " + device.path("/wide") +

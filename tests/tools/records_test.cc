@@ -52,7 +52,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
                "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
                "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
                "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n",
-               torn + "tavrelctl: 3 lines passed over, no record; the first is line 2 of " +
+               torn + "tavrelctl: 3 lines skipped, not a record; the first is line 2 of " +
                    device.path(kRecords) +
                    "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n"}));
   EXPECT_EQ(device.run("records show --day 2026-11-02").out,
@@ -68,7 +68,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
   device.check("records show --day 20784",
                {1, "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n",
                 "tavrelctl: cannot read " + device.path(kRecords) +
-                    "172-2026-11-27.jsonl: it is no regular file\n"});
+                    "172-2026-11-27.jsonl: it is not a regular file\n"});
 }
 
 TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {

@@ -46,12 +46,13 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
   const std::pair<std::string, std::string> kCases[] = {
       {R"({"a": {"b": null}})", "JSON/a/b: null has no place in a property list"},
       {"18446744073709551616", "JSON: the integer 18446744073709551616 does not fit 64 bits"},
-      {R"({"$data": "?"})", "JSON/$data: \"$data\" is no base64"},
+      {R"({"$data": "?"})", "JSON/$data: \"$data\" is not base64"},
       {R"({"$real": "1"})", "JSON/$real: \"$real\" is none of \"nan\", \"inf\", \"-inf\""},
       {R"({"$date": "today"})",
        "JSON/$date: not a date: today: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD"},
-      {R"({"$data": "", "x": 1})", "JSON/x: \"$data\" stands alone in its object and holds a text"},
-      {R"({"$x": 1})", "JSON/$x: \"$x\" is no known form: write a key that begins with $ as $$"},
+      {R"({"$data": "", "x": 1})",
+       "JSON/x: \"$data\" must be the only member of its object, and a string"},
+      {R"({"$x": 1})", "JSON/$x: \"$x\" is not a known form: write a key that begins with $ as $$"},
       {std::string(200, '['), "JSON: nested too deeply"}};
   for (const auto& [text, message] : kCases) {
     const auto value = parseJsonValue(text);

@@ -31,10 +31,10 @@ A/ScalarKeys/number: is an integer: options are a dictionary, an empty one to re
 A/ScalarKeys/options/bucket_interval: is 0: a bucket has a width: the value is not bucketed
 A/ScalarKeys/options/intervals: does not affect scalars: ignored
 A/ScalarKeys/options/sig_fig: is -1: expected an integer from 0 to 4294967295: used as 4294967295
-A/ScalarKeys/options/sigfig: is no option: ignored; the options are sig_fig, bucket_interval, intervals
+A/ScalarKeys/options/sigfig: is not an option: ignored; the options are sig_fig, bucket_interval, intervals
 A/ScalarKeys/types/bucket_interval: is 2.5: expected an integer from 0 to 4294967295: used as 2
 A/ScalarKeys/types/sig_fig: is a string: expected an integer: ignored
-A/Scalars: is no table of a group: ignored; the tables are ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes
+A/Scalars: is not a table of a group: ignored; the tables are ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes
 B/DistributionKeys/d/intervals: is an integer: expected an array of numbers: no histogram is made
 B/DistributionKeys/d/sig_fig: does not affect distributions: ignored
 B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty
@@ -67,7 +67,7 @@ TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
                      "is reported\n",
                      ""}));
   EXPECT_EQ(device.run("whitelist check -", xmlOf("{}")),
-            prints("standard input: nothing to mend (digest 06e68461460e3d5f71e4211e51eb944c)\n"));
+            prints("standard input: no findings (digest 06e68461460e3d5f71e4211e51eb944c)\n"));
 }
 
 TEST(WhitelistCheck, ListsAThousandFindingsAndCountsTheRest) {
@@ -101,7 +101,7 @@ TEST(WhitelistExplain, NamesTheRuleAndShowsWhatItDoes) {
       {"radio.x", "-15.5", R"(radio.x
   scalar        group Radio, prefix radio.
                 sig_fig 1
-                the value is no 64-bit integer, as scalars are
+                the value is not a 64-bit integer, so it cannot be a scalar
   distribution  group Radio, prefix radio.
                 summary only
 )"},

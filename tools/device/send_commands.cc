@@ -123,7 +123,7 @@ Expected<plist::Array> appDataOf(const plist::Value& applications) {
     const auto wrong = [i](std::string_view entry, std::string_view wanted) {
       return Error{format("application %llu: \"%s\" must be %s", std::uint64_t{i}, entry, wanted)};
     };
-    if (!application) return Error{format("element %llu is no dictionary", std::uint64_t{i})};
+    if (!application) return Error{format("element %llu is not a dictionary", std::uint64_t{i})};
     plist::Dictionary checked = plist::Dictionary::create(5);
     for (const std::string_view entry : {"bundle_id", "version"}) {
       if (!application.string(entry)) return wrong(entry, "a string");

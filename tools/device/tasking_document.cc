@@ -56,7 +56,8 @@ class Findings {
   void refuseOtherTexts(const plist::Value& value, const std::string& path) {
     if (hasXmlTextsOnly(value)) return;
     add(path,
-        "holds text that no preference can: property lists hold no control characters and only "
+        "contains text that preferences cannot store: property lists contain no control characters "
+        "and only "
         "UTF-8: give such bytes as data");
   }
 
@@ -99,7 +100,7 @@ std::vector<std::string> checkTasking(const plist::Value& tasking) {
     const auto domain = findings.requireText(setting, "Domain", path + "/Domain");
     const auto key = findings.requireText(setting, "Key", path + "/Key");
     if (domain && !FilePreferences::isValidDomain(*domain)) {
-      findings.add(path + "/Domain", "is no name of a preference domain");
+      findings.add(path + "/Domain", "is not the name of a preference domain");
     }
     if (!setting.contains("Value")) findings.add(path + "/Value", "is missing");
     if (domain && key && !settings.emplace(*domain, *key).second) {

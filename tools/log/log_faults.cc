@@ -65,7 +65,7 @@ std::vector<std::string> faultsOf(const plist::Dictionary& log) {
     const auto* const member = std::find_if(std::begin(kMembers), std::end(kMembers),
                                             [&](const Member& m) { return m.key == entry.key; });
     if (member == std::end(kMembers)) {
-      faults.push_back(format("%s: is no part of a tallied log", entry.key));
+      faults.push_back(format("%s: is not part of a tallied log", entry.key));
     } else if (member->kind != Kind::Null && member->kind != entry.value.kind()) {
       faults.push_back(notA(entry.key, entry.value, member->kindText));
     }
@@ -77,7 +77,7 @@ std::vector<std::string> faultsOf(const plist::Dictionary& log) {
   const plist::Dictionary summaries = log.dictionary("BHDistributions");
   for (const plist::Entry& summary : summaries) {
     if (isSummary(summary.value)) continue;
-    faults.push_back(format("BHDistributions/%s: is no summary of five numbers", summary.key));
+    faults.push_back(format("BHDistributions/%s: is not a summary of five numbers", summary.key));
   }
   for (const plist::Entry& histogram : log.dictionary("BHDistributionsHistogram")) {
     checkHistogram(summaries, histogram, faults);

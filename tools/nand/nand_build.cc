@@ -61,9 +61,10 @@ class Builder {
     const plist::Dictionary object = entry.dictionary();
     if (object.contains("hex") && object.size() == 1) return addHex(object.get("hex"));
     if (object.contains("key")) return addRecord(object);
-    return Error{format(
-        "%s is no entry: give [statistic, value], {\"key\": …, \"values\": […]} or {\"hex\": …}",
-        inlineText(entry))};
+    return Error{
+        format("%s is not an entry: give [statistic, value], {\"key\": …, \"values\": […]} or "
+               "{\"hex\": …}",
+               inlineText(entry))};
   }
 
   std::string take() { return std::move(bytes_); }
@@ -110,7 +111,8 @@ class Builder {
   Status addValue(const plist::Value& value) {
     const auto number = unsignedOf(value);
     if (!number) {
-      return Error{format("%s is no value: give an integer from 0 to 2^64 - 1", inlineText(value))};
+      return Error{
+          format("%s is not a value: give an integer from 0 to 2^64 - 1", inlineText(value))};
     }
     appendLittle(bytes_, *number, 8);
     return Done{};
@@ -162,20 +164,22 @@ class Builder {
     for (const plist::Entry& member : record) {
       const std::string_view name = member.key;
       if (name != "key" && name != "count" && name != "values") {
-        return Error{format("\"%s\" is no member of a record: it has key, count and values", name)};
+        return Error{
+            format("\"%s\" is not a member of a record: it has key, count and values", name)};
       }
     }
     const auto key = keyOf(record.get("key"));
     if (!key) return key.error();
     const plist::Value list = record.get("values");
     const plist::Array values = list ? list.array() : plist::Array::create();
-    if (!values) return Error{format("\"values\": %s is no list", inlineText(list))};
+    if (!values) return Error{format("\"values\": %s is not a list", inlineText(list))};
     const plist::Value said = record.get("count");
     std::uint64_t count = values.size();
     if (said) {
       const auto word = wordOf(said);
       if (!word) {
-        return Error{format("\"count\": %s is no integer from 0 to 2^32 - 1", inlineText(said))};
+        return Error{
+            format("\"count\": %s is not an integer from 0 to 2^32 - 1", inlineText(said))};
       }
       count = *word;
     }
@@ -218,7 +222,7 @@ Expected<std::string> buildStatistics(const plist::Value& document) {
   for (const plist::Entry& member : object) {
     if (!isKnownMember(member.key)) {
       return Error{
-          format("\"%s\" is no member of this form: records stand in \"entries\"", member.key)};
+          format("\"%s\" is not a member of this form: records belong in \"entries\"", member.key)};
     }
   }
   Builder builder;

@@ -86,10 +86,10 @@ int parseInto(ToolContext& context, const std::string& file, std::string_view by
   const int result = ASPParseBufferToCxt(statistics, asBytes(bytes));
   if (result == 0) {
     const auto fault = faultOfStatistics(asBytes(bytes));
-    context.fail(format("%s is no whole statistics buffer: %s: fetch or build it anew",
+    context.fail(format("%s is not a complete statistics buffer: %s: fetch or build it again",
                         nameOf(file), fault ? *fault : "it has more values than can be listed"));
   } else if (const std::size_t surplus = bytes.size() % 8; surplus != 0) {
-    context.note(format("%s: the last %zu bytes are no whole unit of 8 and were passed over",
+    context.note(format("%s: the last %zu bytes are less than a unit of 8 and were skipped",
                         nameOf(file), surplus));
   }
   return result;
@@ -132,7 +132,7 @@ void counters(ToolContext& context, const Arguments& arguments) {
   if (!bytes) return context.fail(bytes.error().message);
   if (bytes->size() != kCounterBlockBytes) {
     return context.fail(
-        format("%s is no counter block: it has %zu bytes, and a block has %zu: cut "
+        format("%s is not a counter block: it has %zu bytes, and a block has %zu: cut "
                "one out with dd bs=%zu count=1 skip=CHANNEL",
                nameOf(arguments.file), bytes->size(), kCounterBlockBytes, kCounterBlockBytes));
   }
@@ -155,7 +155,7 @@ void snapshot(ToolContext& context, const Arguments& arguments) {
   const bool hasDescriptor = !arguments.other.empty();
   if (!hasDescriptor && records->size() < kSnapshotRecordBytes) {
     return context.fail(format(
-        "%s holds no whole record: it has %zu bytes, and a record has %zu: give a timeline of the "
+        "%s has no complete record: it has %zu bytes, and a record has %zu: give a timeline of the "
         "controller, and --descriptor if one came with it",
         nameOf(arguments.file), records->size(), kSnapshotRecordBytes));
   }
@@ -173,7 +173,7 @@ void snapshot(ToolContext& context, const Arguments& arguments) {
   }
   if (const std::size_t surplus = records->size() % kSnapshotRecordBytes;
       !hasDescriptor && surplus > 0) {
-    context.note(format("%s: the last %zu bytes are no whole record of %zu and were passed over",
+    context.note(format("%s: the last %zu bytes are less than a record of %zu and were skipped",
                         nameOf(arguments.file), surplus, kSnapshotRecordBytes));
   }
   context.out() << *text;

@@ -25,7 +25,7 @@ Status RecordReader::read(bool isComplete, const LineHandler& handler) {
   const Descriptor file(open(path_.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
   struct stat status {};
   if (!file || fstat(file.get(), &status) != 0) return systemError("read", path_);
-  if (!S_ISREG(status.st_mode)) return Error{"cannot read " + path_ + ": it is no regular file"};
+  if (!S_ISREG(status.st_mode)) return Error{"cannot read " + path_ + ": it is not a regular file"};
   if (status.st_size < offset_) {
     offset_ = 0;
     lines_ = tornLines_ = 0;

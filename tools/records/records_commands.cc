@@ -184,7 +184,7 @@ class RecordsView {
 
   void noteFaults() {
     if (faults_ == 0) return;
-    context_.note(format("%s passed over, no record; the first is %s",
+    context_.note(format("%s skipped, not a record; the first is %s",
                          counted(std::exchange(faults_, 0), "line"), firstFault_));
   }
 

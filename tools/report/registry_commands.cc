@@ -120,8 +120,8 @@ void show(ToolContext& context, const Arguments& arguments) {
 void record(ToolContext& context, const Arguments& arguments) {
   const auto [recording, isWhole] = currentRecording(context);
   if (!isWhole) {
-    return context.fail(
-        format("nothing is written to %s: mend or remove what could not be read", arguments.file));
+    return context.fail(format("nothing is written to %s: repair or remove what could not be read",
+                               arguments.file));
   }
   const auto document = plist::writeXml(recording);
   if (!document) {

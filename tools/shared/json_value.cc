@@ -53,7 +53,7 @@ Json jsonOfNumber(const plist::Number& number) {
 Expected<plist::Value> valueOfSpecial(std::string_view member, std::string_view text) {
   if (member == kDataMember) {
     std::vector<std::byte> bytes;
-    if (!readBase64(text, bytes)) return Error{"\"$data\" is no base64"};
+    if (!readBase64(text, bytes)) return Error{"\"$data\" is not base64"};
     return plist::Value(plist::Data(bytes));
   }
   if (member == kDateMember) {
@@ -106,7 +106,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
       const plist::Entry& only = *object.begin();
       const auto text = only.value.string();
       if (object.size() != 1 || !text) {
-        return fail(format("\"%s\" stands alone in its object and holds a text", only.key));
+        return fail(format("\"%s\" must be the only member of its object, and a string", only.key));
       }
       auto meant = valueOfSpecial(only.key, *text);
       if (!meant) return fail(meant.error().message);
@@ -161,7 +161,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     } else if (key.starts_with("$$")) {
       key.remove_prefix(1);
     } else if (key.starts_with('$')) {
-      return fail(format("\"%s\" is no known form: write a key that begins with $ as $$", key));
+      return fail(format("\"%s\" is not a known form: write a key that begins with $ as $$", key));
     }
     object.set(key, std::move(value));
     return true;

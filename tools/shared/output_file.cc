@@ -19,7 +19,7 @@ Status writeOutput(ToolContext& context, const std::string& file, std::string_vi
   // Replacing a device or a pipe by a file is never intended.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
-    return Error{format("cannot write %s: it is no regular file: use -o - and redirect", file)};
+    return Error{format("cannot write %s: it is not a regular file: use -o - and redirect", file)};
   }
   const auto path = std::filesystem::absolute(file);
   // Missing folders are a typing error here; do not make them.

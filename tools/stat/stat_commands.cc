@@ -151,8 +151,8 @@ void addStatCommands(Command app, ToolContext& context) {
   context.addJsonOption(import);
 
   const Command exported =
-      addCommand(group, "export", "Write what is held, in the form that import reads", arguments,
-                 context, [](ToolContext& tool, const Arguments& given) {
+      addCommand(group, "export", "Write the content of the store in the form that import reads",
+                 arguments, context, [](ToolContext& tool, const Arguments& given) {
                    std::optional<std::int32_t> day;
                    if (parseDayOption(tool, given.day, day)) {
                      exportStatistics(tool, given.key, day);
@@ -178,12 +178,12 @@ void addStatCommands(Command app, ToolContext& context) {
                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
       .required();
 
-  const Command listed = addCommand(group, "list", "List what is held, by day", arguments, context,
-                                    [](ToolContext& tool, const Arguments& given) {
-                                      std::optional<std::int32_t> day;
-                                      if (parseDayOption(tool, given.day, day))
-                                        listStatistics(tool, given.key, day);
-                                    });
+  const Command listed =
+      addCommand(group, "list", "List the content of the store by day", arguments, context,
+                 [](ToolContext& tool, const Arguments& given) {
+                   std::optional<std::int32_t> day;
+                   if (parseDayOption(tool, given.day, day)) listStatistics(tool, given.key, day);
+                 });
   addSelection(listed, *arguments);
   context.addJsonOption(listed);
 

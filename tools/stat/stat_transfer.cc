@@ -96,7 +96,7 @@ void exportStatistics(ToolContext& context, const std::string& prefix,
     progress.count("exported", ++rows);
     if (isExportable(key)) return true;
     context.fail(format(
-        "not exported: the key \"%s\" is empty or holds a tab, a line end or bytes that are no "
+        "not exported: the key \"%s\" is empty or contains a tab, a line end or bytes that are not "
         "UTF-8: read the store with sqlite3",
         printable(key.substr(0, 60))));
     return false;

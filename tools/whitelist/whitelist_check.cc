@@ -108,7 +108,7 @@ class Checker {
       const Place place(*this, table.key);
       const auto known = tableNamed(table.key);
       if (!known) {
-        add(format("is no table of a group: ignored; the tables are %s", kTableNames));
+        add(format("is not a table of a group: ignored; the tables are %s", kTableNames));
       } else if (!table.value.dictionary()) {
         add(format("is %s: a table is a dictionary from keys to options: ignored",
                    kindWithArticle(table.value)));
@@ -142,7 +142,7 @@ class Checker {
     const bool isIntervals = option.key == kIntervalsOption;
     if (!isIntervals && option.key != kSignificantFiguresOption &&
         option.key != kBucketIntervalOption) {
-      add("is no option: ignored; the options are sig_fig, bucket_interval, intervals");
+      add("is not an option: ignored; the options are sig_fig, bucket_interval, intervals");
     } else if (isIntervals != isDistributionTable(table)) {
       add(isIntervals ? "does not affect scalars: ignored"
                       : "does not affect distributions: ignored");

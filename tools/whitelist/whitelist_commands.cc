@@ -62,7 +62,7 @@ void check(ToolContext& context, const Arguments& arguments) {
     context.out() << printable(place + ": " + message) << '\n';
   }
   if (findings.empty()) {
-    context.out() << printable(whitelist->name) << ": nothing to mend (digest " << digest << ")\n";
+    context.out() << printable(whitelist->name) << ": no findings (digest " << digest << ")\n";
   }
 }
 

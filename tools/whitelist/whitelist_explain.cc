@@ -183,7 +183,7 @@ void printExplanation(std::ostream& out, const KeyExplanation& explanation) {
     scalarEffect = format("%lld is reported as %lld", *explanation.example->scalar,
                           *explanation.coarsenedScalar);
   } else if (explanation.example && explanation.scalar.options) {
-    scalarEffect = "the value is no 64-bit integer, as scalars are";
+    scalarEffect = "the value is not a 64-bit integer, so it cannot be a scalar";
   }
   if (explanation.bucket) {
     distributionEffect =

@@ -14,8 +14,8 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
   if (!*bytes) return {};
   const auto value = propertyLists.decode(asBytes(**bytes));
   if (value && value->dictionary()) return value->dictionary();
-  const std::string reason = value ? "it holds no dictionary" : value.error().message;
-  log.log(LogLevel::Error, "cannot read %s: %s; mend or remove it", path, reason);
+  const std::string reason = value ? "it is not a dictionary" : value.error().message;
+  log.log(LogLevel::Error, "cannot read %s: %s; repair or remove it", path, reason);
   return {};
 }
 

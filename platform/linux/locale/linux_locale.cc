@@ -126,7 +126,7 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
     if (listed.addNamed(line)) return;
     std::string message = root_.path(kLanguagesFile) + ": ";
     appendQuoted(message, line);
-    message += " is no language; write one tag a line, such as de or pt-BR";
+    message += " is not a language; write one tag per line, such as de or pt-BR";
     log_.write(LogLevel::Error, message);
   });
   if (present) return listed.take();

@@ -62,7 +62,7 @@ void FilePreferences::ZTXPreferencesSetValue(std::string_view key, const plist::
                                              std::string_view domain) {
   if (!isValidDomain(domain)) {
     log_.log(LogLevel::Error,
-             "cannot set preference %s: %s is no name of a domain; use 1 to %d characters "
+             "cannot set preference %s: %s is not the name of a domain; use 1 to %d characters "
              "without slash, control character or a dot in front",
              quoted(key.substr(0, limits::kPreferenceDomainBytes)),
              quoted(domain.substr(0, limits::kPreferenceDomainBytes)),
@@ -116,7 +116,7 @@ Expected<FilePreferences::Content> FilePreferences::readContent(const std::strin
   auto value = propertyLists_.decode(asBytes(content.bytes));
   if (value) content.values = value->dictionary();
   if (!value || !content.values) {
-    content.fault = value ? "it holds no dictionary" : value.error().message;
+    content.fault = value ? "it is not a dictionary" : value.error().message;
   }
   return content;
 }
@@ -130,7 +130,7 @@ const plist::Dictionary& FilePreferences::storedOf(Domain& domain, std::string_v
     fault = content.error().message;
   } else if (!content->fault.empty()) {
     fault = "cannot read preferences " + path + ": " + content->fault +
-            "; mend it, or the next write sets it aside";
+            "; repair it, or the next write sets it aside";
   }
   if (!fault.empty() && !domain.unreadableReported) log_.write(LogLevel::Error, fault);
   domain.unreadableReported = !fault.empty();
@@ -240,8 +240,8 @@ Status FilePreferences::setAside(const std::string& path, std::string_view fault
   const std::string aside =
       path + ".corrupt-" + compactStamp(clock_.now()) + "-" + randomName().substr(0, 4);
   if (Status moved = files_.rename(path, aside); !moved) return moved;
-  log_.log(LogLevel::Error, "preferences %s could not be read (%s): kept as %s, begun anew", path,
-           fault, aside);
+  log_.log(LogLevel::Error, "preferences %s could not be read (%s): kept as %s; a new file begins",
+           path, fault, aside);
   return Done{};
 }
 

@@ -56,7 +56,7 @@ const char* HubChannels::addOne(const plist::Dictionary& channel) {
   bool isWhole = isGroup(elements);
   if (groups) isWhole = !groups.empty() && std::all_of(groups.begin(), groups.end(), isGroup);
   if (!isWhole) {
-    return "its \"Elements\" are no groups of it; give elements of 64 bytes with its ids, the "
+    return "its \"Elements\" are not groups of it; give elements of 64 bytes with its ids, the "
            "first with their number at offset 20";
   }
   if (!channels_.emplace(Key{*driverID, *channelID}, HubChannel(elements)).second) {

@@ -58,7 +58,7 @@ Expected<std::uint64_t> FileNotifications::tryPost(std::string_view name) {
     return written.error();
   }
   if (!before) {
-    log_.log(LogLevel::Error, "%s; counting begins anew at %llu", before.error().message, now);
+    log_.log(LogLevel::Error, "%s; counting restarts at %llu", before.error().message, now);
   }
   return now;
 }
@@ -75,7 +75,7 @@ Expected<std::uint64_t> FileNotifications::count(std::string_view name) const {
   const char* end = digits.data() + digits.size();
   const auto [stop, error] = std::from_chars(digits.data(), end, number);
   if (error != std::errc() || std::string_view(stop, end) != "\n") {
-    return Error{format("%s holds no number and a line end", *path)};
+    return Error{format("%s does not contain a number and a line end", *path)};
   }
   return number;
 }

@@ -30,7 +30,7 @@ Error systemFailure(const char* what) {
 
 Expected<plist::Dictionary> readMessageFile(int file) {
   const int seals = fcntl(file, F_GET_SEALS);
-  if (seals < 0) return Error{"the descriptor passed is no memory file that can be sealed"};
+  if (seals < 0) return Error{"the descriptor passed is not a memory file that can be sealed"};
   if ((seals & kNeededSeals) != kNeededSeals) {
     return Error{"the memory file is not sealed against shrinking, growing and writing"};
   }
@@ -125,7 +125,7 @@ Status sendPacket(int socket, ByteSpan content, const Descriptor& file) {
 Expected<plist::Dictionary> decodeMessage(ByteSpan bytes) {
   const auto value = plist::read(bytes);
   if (!value) return value.error();
-  if (value->kind() != plist::Kind::Dictionary) return Error{"the message is no dictionary"};
+  if (value->kind() != plist::Kind::Dictionary) return Error{"the message is not a dictionary"};
   return value->dictionary();
 }
 

@@ -38,7 +38,7 @@ Status removeStale(const std::string& path, const SocketAddress& address) {
     return systemError("take the status of", path);
   }
   if (!S_ISSOCK(status.st_mode)) {
-    return Error{format("cannot listen at %s: the file there is no socket; remove it", path)};
+    return Error{format("cannot listen at %s: the file there is not a socket; remove it", path)};
   }
   // The service manager listens without the lock, and would start the service for a connection. A
   // socket of another type never makes one: the kernel refuses its type when a process listens, and

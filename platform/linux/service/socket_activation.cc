@@ -78,10 +78,11 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
     const bool isNamed = index < names.size() && names[index] == name;
     if (!isListeningPacketSocket(descriptor)) {
       if (isNamed) {
-        log.log(LogLevel::Error,
-                "descriptor %d of LISTEN_FDS, named %s, is no listening sequenced-packet socket: "
-                "use ListenSequentialPacket= and Accept=no in the socket unit",
-                descriptor, name);
+        log.log(
+            LogLevel::Error,
+            "descriptor %d of LISTEN_FDS, named %s, is not a listening sequenced-packet socket: "
+            "use ListenSequentialPacket= and Accept=no in the socket unit",
+            descriptor, name);
       }
       continue;
     }

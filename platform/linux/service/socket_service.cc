@@ -27,7 +27,7 @@ void raiseDescriptorLimit() {
 
 std::unique_ptr<ServiceListener> SocketServices::createListener(std::string_view name) {
   if (!isServiceName(name)) {
-    log_.log(LogLevel::Debug, "cannot listen as %s: the name is no file name", name);
+    log_.log(LogLevel::Debug, "cannot listen as %s: the name is not a file name", name);
     return nullptr;
   }
   raiseDescriptorLimit();

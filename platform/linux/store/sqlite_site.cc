@@ -111,7 +111,7 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
                                                   ": run as the owner of its folder"};
     }
     log.write(LogLevel::Error, describe(failure) + "; it is now " + name +
-                                   " and a new store is begun: inspect or remove that file");
+                                   " and a new store begins: inspect or remove that file");
   } catch (const StoreFailure& obstacle) {
     return StoreFailure{failure.fault, failure.message + "; " + obstacle.message};
   }
