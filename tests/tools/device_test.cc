@@ -160,7 +160,7 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
         "TaskingPayload[2]/Domain: is missing", "TaskingPayload[2]/Value: is missing",
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
-       {"TaskingPayload[0]: contains text that preferences cannot store: property lists hold no "
+       {"TaskingPayload[0]: contains text that preferences cannot store: property lists contain no "
         "control "
         "characters and only UTF-8: give such bytes as data"}}};
   for (const auto& [document, findings] : cases) {

@@ -171,7 +171,7 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
       device.run("nand parse -", words({4, 1, 1, 0, 0})),
       (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
                "tavrelctl: standard input: the last 4 bytes are less than a unit of 8 and were "
-               "passed over\n"}));
+               "skipped\n"}));
 }
 
 TEST(NandParse, DifferencesPairEqualNamesInTheirOrder) {
