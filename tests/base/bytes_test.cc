@@ -5,6 +5,8 @@
 #include <limits>
 
 #include "base/arithmetic.h"
+#include "base/base64.h"
+#include "base/iso_date.h"
 
 namespace tavrel {
 namespace {
@@ -17,9 +19,8 @@ TEST(Bytes, LoadsOnlyWhatLiesInside) {
   EXPECT_EQ(loadLittle16(bytes, 7), 0x09F8);
   EXPECT_EQ(loadLittle32(bytes, 1), 0x05040302U);
   EXPECT_EQ(loadLittle64(bytes, 0), 0xF807060504030201U);
-  for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64}) {
+  for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64})
     EXPECT_FALSE(loadByte(bytes, beyond));
-  }
   EXPECT_FALSE(loadLittle16(bytes, 8) || loadLittle32(bytes, 6) || loadLittle64(bytes, 2));
   EXPECT_EQ(slice(bytes, 9, 0)->size(), 0U);
   EXPECT_EQ(asText(*slice(bytes, 0, 2)), "\x01\x02");
@@ -39,16 +40,40 @@ TEST(Bytes, StoresWhollyOrNotAtAll) {
 }
 
 TEST(Arithmetic, IsDefinedAtTheEnds) {
-  constexpr auto kMin = std::numeric_limits<std::int64_t>::min();
-  constexpr auto kMax = std::numeric_limits<std::int64_t>::max();
-  EXPECT_EQ(wrappingAdd(kMax, 1), kMin);
-  EXPECT_EQ(previousDay(std::numeric_limits<std::int32_t>::min()),
-            std::numeric_limits<std::int32_t>::max());
+  EXPECT_EQ(wrappingAdd(INT64_MAX, 1), INT64_MIN);
+  EXPECT_EQ(previousDay(INT32_MIN), INT32_MAX);
   EXPECT_EQ(shiftLeft(1, 64), 0U);
   EXPECT_EQ(checkedMultiply(1UL << 32, (1UL << 32) - 1), kMax64 - (1UL << 32) + 1);
   EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
   EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);
-  EXPECT_EQ(saturatingInt64(-9223372036854775808.0), kMin);
+  EXPECT_EQ(saturatingInt64(-9223372036854775808.0), INT64_MIN);
+}
+
+TEST(Base64, RefusesWrongLengthsAndPadding) {
+  std::vector<std::byte> read;
+  for (const std::string_view text :
+       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="})
+    EXPECT_FALSE(readBase64(text, read)) << text;
+  for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
+    std::vector<std::byte> bytes(size);
+    for (std::size_t i = 0; i < size; ++i)
+      bytes[i] = static_cast<std::byte>(255 - i);
+    std::string text = "\n ";
+    appendBase64(text, bytes);
+    EXPECT_TRUE(readBase64(text, read));
+    EXPECT_EQ(read, bytes);
+  }
+}
+
+TEST(Dates, AreReadAsTheyAreWritten) {
+  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
+    const auto date = plist::Date::sinceEpoch(seconds);
+    EXPECT_EQ(*parseIsoDate(isoDateText(date)), date) << isoDateText(date);
+  }
+  for (const std::string_view text :
+       {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
+        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"})
+    EXPECT_FALSE(parseIsoDate(text)) << text;
 }
 
 }  // namespace

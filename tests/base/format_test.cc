@@ -30,9 +30,8 @@ template <class Argument>
 void compare(const std::vector<std::string>& conversions, const std::vector<Argument>& values) {
   for (unsigned flags = 0; flags < 32; ++flags) {
     std::string start = "<%";
-    for (unsigned i = 0; i < 5; ++i) {
+    for (unsigned i = 0; i < 5; ++i)
       if (flags >> i & 1U) start += "-+ #0"[i];
-    }
     for (const char* width : {"", "1", "6", "33"}) {
       for (const char* precision : {"", ".", ".1", ".3", ".17", ".40"}) {
         for (const std::string& conversion : conversions) {

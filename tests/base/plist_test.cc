@@ -76,10 +76,9 @@ TEST(Value, EqualityLooksAtKindAndContent) {
   const Value dictionary = Dictionary{{"1", 1}}, noDictionary = Dictionary::create();
   const Value values[] = {none,  true, false,  1,     0,       "",         "1",         date,
                           epoch, data, noData, array, noArray, dictionary, noDictionary};
-  for (std::size_t i = 0; i < std::size(values); ++i) {
+  for (std::size_t i = 0; i < std::size(values); ++i)
     for (std::size_t j = 0; j < std::size(values); ++j)
       EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
-  }
   EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"b", 2.0}, {"a", 1L}}));
   EXPECT_NE(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"a", 1}, {"c", 2}}));
   EXPECT_EQ(Value(Date::sinceEpoch(NAN)), Value(Date::sinceEpoch(NAN)));
@@ -142,11 +141,10 @@ TEST(Dictionary, KeepsOrderAndContentThroughManyChanges) {
         EXPECT_EQ(dictionary.remove(key), content.erase(key) == 1);
         std::erase(order, key);
       } else {
-        if (random() % 2 == 0) {
+        if (random() % 2 == 0)
           dictionary.set(key, step);
-        } else {
+        else
           dictionary.set(String(key), step);
-        }
         if (content.insert_or_assign(key, step).second) order.push_back(key);
       }
       ASSERT_EQ(dictionary.size(), content.size());

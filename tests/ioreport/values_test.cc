@@ -207,17 +207,16 @@ TEST(UnitTest, WorksOutEveryPairOfExponents) {
   const auto exponentOf = [](std::uint32_t byte) {
     return byte == 0 ? 0 : byte == 255 ? -128 : static_cast<int>(byte) - 127;
   };
+  using Case = std::tuple<std::uint32_t, std::uint64_t, std::uint64_t>;
   for (std::uint32_t scale = 0; scale <= 0xFFFF; ++scale) {
     const int tens = exponentOf(scale & 0xFF);
     const int twos = exponentOf(scale >> 8);
-    for (const std::uint32_t word : {0U, 7U, 0x80000007U, 0x80000000U}) {
-      const std::uint64_t factor = (word & 0x7FFFFFFF) != 0 ? word & 0x7FFFFFFF : 1;
-      const bool divides = word >> 31 != 0;
-      std::uint64_t up = 99;
-      std::uint64_t down = 99;
+    for (const auto& [word, factor, divisor] :
+         {Case(0, 1, 1), Case(7, 7, 1), Case(0x80000007, 1, 7), Case(0x80000000, 1, 1)}) {
+      std::uint64_t up = 99, down = 99;
       ASSERT_EQ(getFactorsFromScale(word, scale, up, down), kKernelSuccess);
-      ASSERT_EQ(up, scaled(divides ? 1 : factor, tens, twos)) << scale;
-      ASSERT_EQ(down, scaled(divides ? factor : 1, -tens, -twos)) << scale;
+      ASSERT_EQ(up, scaled(factor, tens, twos)) << scale;
+      ASSERT_EQ(down, scaled(divisor, -tens, -twos)) << scale;
     }
   }
 }
@@ -304,9 +303,9 @@ struct FakeWriter : DescriptorWriter {
 
 TEST(DescriptionTest, WritesTextsWithOneCall) {
   FakeWriter writer;
-  const std::pair<std::ptrdiff_t, KernelReturn> kCases[] = {
-      {4, 0}, {3, kKernelUnderrun}, {5, kKernelError}, {-1, kKernelIOError}};
-  for (const auto& [answer, code] : kCases) {
+  using Case = std::pair<std::ptrdiff_t, KernelReturn>;
+  for (const auto& [answer, code] :
+       {Case(4, 0), Case(3, kKernelUnderrun), Case(5, kKernelError), Case(-1, kKernelIOError)}) {
     writer.answer = answer;
     EXPECT_EQ(IOReportWriteStringUTF8(writer, 1, "text\0more"s), code);
     EXPECT_EQ(writer.written, "text");
