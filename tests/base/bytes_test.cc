@@ -2,7 +2,6 @@
 
 #include <array>
 #include <gtest/gtest.h>
-#include <limits>
 
 #include "base/arithmetic.h"
 #include "base/base64.h"
@@ -11,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-constexpr auto kMax64 = std::numeric_limits<std::uint64_t>::max();
+constexpr auto kMax64 = UINT64_MAX;
 
 TEST(Bytes, LoadsOnlyWhatLiesInside) {
   const ByteSpan bytes = asBytes("\x01\x02\x03\x04\x05\x06\x07\xF8\x09");

@@ -14,7 +14,7 @@ namespace {
 template <class... Arguments>
 std::string printedByC(const std::string& format, Arguments... arguments) {
   int (*const print)(char*, std::size_t, const char*, ...) = std::snprintf;
-  char text[5000];
+  char text[20000];
   const int length = print(text, sizeof text, format.c_str(), arguments...);
   return {text, static_cast<std::size_t>(length)};
 }
@@ -60,14 +60,10 @@ TEST(Format, PrintsAsTheCLibraryDoes) {
 }
 
 TEST(Format, TakesWidthAndPrecisionFromArguments) {
-  for (const int width : {0, 3, 12, -12, 4096, -4096}) {
-    for (const int precision : {0, 2, 9, -1, INT_MIN}) {
-      EXPECT_EQ(format("%0*.*d|", width, precision, -42),
-                printedByC("%0*.*d|", width, precision, -42));
-      EXPECT_EQ(format("%*.*f|", width, precision, 2.5),
-                printedByC("%*.*f|", width, precision, 2.5));
-      EXPECT_EQ(format("%*.*s|", width, precision, "abc"),
-                printedByC("%*.*s|", width, precision, "abc"));
+  for (const int w : {0, 3, 12, -12, 4096, -4096}) {
+    for (const int p : {0, 2, 9, -1, INT_MIN}) {
+      EXPECT_EQ(format("%0*.*d|%*.*f|%*.*s|", w, p, -42, w, p, 2.5, w, p, "abc"),
+                printedByC("%0*.*d|%*.*f|%*.*s|", w, p, -42, w, p, 2.5, w, p, "abc"));
     }
   }
   EXPECT_EQ(format("%.4096f", DBL_MAX).size(), 309U + 1 + 4096);

@@ -1,4 +1,3 @@
-// Programs record; what they leave is read back exactly.
 #include <algorithm>
 #include <csignal>
 #include <random>
@@ -90,8 +89,7 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
   run([&] {
     add(1);
     record(1);
-    const Gate recorded;
-    const Gate left;
+    const Gate recorded, left;
     if (fork() == 0) {
       if (fork() == 0) {
         // The middle process is a parent that ends first, as of a daemon.

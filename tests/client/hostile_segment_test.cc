@@ -1,5 +1,3 @@
-// Segments that no honest program leaves.
-#include <limits>
 
 #include "recording.h"
 
@@ -109,7 +107,7 @@ TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
       readAll();
       boot = std::nullopt;
       readAll(false);
-      boot = std::numeric_limits<std::int64_t>::max();
+      boot = INT64_MAX;
       readAll();
       boot = 0;
     }

@@ -1,4 +1,3 @@
-// What is installed builds the examples; the library offers its own names and needs only libc.
 #include <cstdlib>
 
 #include "recording.h"

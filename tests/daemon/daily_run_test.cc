@@ -23,7 +23,6 @@ constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 const std::string kNeverCame = "never received requested AAI, so moving along without it";
 const std::string kNotPermitted = "no log for day 19999: diagnostic submission not allowed";
 
-// What every run says of a device that has no storage to ask.
 const std::string kUnread = "error reading nand info, error 1 with message Unable to parse buffer";
 
 const std::string kTotal = "scalar com.norvane.lumenhall.DiskUsageUserTotalBlocks";
@@ -326,7 +325,6 @@ TEST_F(ListenerTest, ForcesADayOnce) {
   EXPECT_EQ(serve({Dictionary{{"operation", 1}, {"value", 18000}}, kAnnounce}),
             Messages{"daily tasks for day 18000"});
   EXPECT_EQ(fake.journal, kTasks);
-  // Numbers count with their low halves.
   EXPECT_EQ(serve({Dictionary{{"operation", (std::int64_t{7} << 32) + 1},
                               {"value", (std::int64_t{7} << 32) - 5}}}),
             Messages{"daily tasks for day -5"});

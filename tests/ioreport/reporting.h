@@ -1,4 +1,3 @@
-// Channels, samples and recorded drivers for the tests of the reporting client.
 #pragma once
 
 #include <array>

@@ -105,7 +105,6 @@ TEST(Binary, HostileObjectsAreRefused) {
   for (char i = 2; i < 9; ++i)
     expanding.push_back("\xAA"s + std::string(10, i));
   expanding.push_back("\x09"s);
-  // The errors follow "offset ".
   const std::pair<std::vector<std::string>, std::string> rows[] = {
       {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of no type that is read"},
       {{"\x15"s}, "8: an integer of more than 16 bytes"},
@@ -231,13 +230,12 @@ TEST(Xml, WritesSortedIndentedDocument) {
 TEST(Xml, ScalarsAreWrittenAndReadBack) {
   using Case = std::pair<Value, std::string>;
   for (const auto& [value, text] :
-       {Case(std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"),
-        Case(std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"),
+       {Case(INT64_MIN, "<integer>-9223372036854775808</integer>"),
+        Case(UINT64_MAX, "<integer>18446744073709551615</integer>"),
         Case(0.1F, "<real>0.10000000149011612</real>"), Case(-0.0, "<real>-0</real>"),
         Case(5e-324, "<real>5e-324</real>"),
         Case(-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"),
-        Case(Date::ofDay(std::numeric_limits<std::int32_t>::min()),
-             "<date>-5877641-06-23T00:00:00Z</date>"),
+        Case(Date::ofDay(INT32_MIN), "<date>-5877641-06-23T00:00:00Z</date>"),
         Case(Data(asBytes("ab")), "<data>\nYWI=\n</data>"),
         Case(Data(asBytes("a")), "<data>\nYQ==\n</data>"),
         Case(Data(ByteSpan()), "<data>\n</data>"), Case(" \t\n\r ", "<string> \t\n&#13; </string>"),
@@ -315,7 +313,6 @@ TEST(Xml, ReadsWhatOthersWrite) {
 }
 
 TEST(Xml, ErrorsSayWhatAndWhere) {
-  // The reasons follow "line 3, column ".
   const std::pair<std::string, std::string> rows[] = {
       {"", "1: <plist> holds no value"},
       {"<true/><true/>", "8: <true> is a second value"},

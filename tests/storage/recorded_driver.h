@@ -50,7 +50,6 @@ inline std::uint64_t fingerprint(std::string_view text) {
   return hash;
 }
 
-/// A request of 24 bytes as the driver must see it.
 inline Data request(std::uint8_t selector, std::uint8_t flags) {
   Bytes bytes(24);
   bytes[0] = std::byte{selector};

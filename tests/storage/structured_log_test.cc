@@ -96,7 +96,6 @@ TEST(StructuredLogTest, HasInfiniteAmplificationWithoutHostWrites) {
   platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 9.5);
   DumpStorageStructuredLog(platform.platform, false);
   EXPECT_TRUE(gNeedValidityList);
-  // Without statistics both are unknown.
   StoragePlatform without(Array{});
   EXPECT_FALSE(DumpStorageStructuredLog(without.platform, false));
   const std::string none = "Could not get matching Kernkit service for exporting classes\n";
