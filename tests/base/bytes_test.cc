@@ -4,8 +4,6 @@
 #include <gtest/gtest.h>
 
 #include "base/arithmetic.h"
-#include "base/base64.h"
-#include "base/iso_date.h"
 
 namespace tavrel {
 namespace {
@@ -46,33 +44,6 @@ TEST(Arithmetic, IsDefinedAtTheEnds) {
   EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
   EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);
   EXPECT_EQ(saturatingInt64(-9223372036854775808.0), INT64_MIN);
-}
-
-TEST(Base64, RefusesWrongLengthsAndPadding) {
-  std::vector<std::byte> read;
-  for (const std::string_view text :
-       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="})
-    EXPECT_FALSE(readBase64(text, read)) << text;
-  for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
-    std::vector<std::byte> bytes(size);
-    for (std::size_t i = 0; i < size; ++i)
-      bytes[i] = static_cast<std::byte>(255 - i);
-    std::string text = "\n ";
-    appendBase64(text, bytes);
-    EXPECT_TRUE(readBase64(text, read));
-    EXPECT_EQ(read, bytes);
-  }
-}
-
-TEST(Dates, AreReadAsTheyAreWritten) {
-  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
-    const auto date = plist::Date::sinceEpoch(seconds);
-    EXPECT_EQ(*parseIsoDate(isoDateText(date)), date) << isoDateText(date);
-  }
-  for (const std::string_view text :
-       {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
-        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"})
-    EXPECT_FALSE(parseIsoDate(text)) << text;
 }
 
 }  // namespace
