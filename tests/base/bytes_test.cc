@@ -2,14 +2,13 @@
 
 #include <array>
 #include <gtest/gtest.h>
-#include <limits>
 
 #include "base/arithmetic.h"
 
 namespace tavrel {
 namespace {
 
-constexpr auto kMax64 = std::numeric_limits<std::uint64_t>::max();
+constexpr auto kMax64 = UINT64_MAX;
 
 TEST(Bytes, LoadsOnlyWhatLiesInside) {
   const ByteSpan bytes = asBytes("\x01\x02\x03\x04\x05\x06\x07\xF8\x09");
@@ -17,9 +16,8 @@ TEST(Bytes, LoadsOnlyWhatLiesInside) {
   EXPECT_EQ(loadLittle16(bytes, 7), 0x09F8);
   EXPECT_EQ(loadLittle32(bytes, 1), 0x05040302U);
   EXPECT_EQ(loadLittle64(bytes, 0), 0xF807060504030201U);
-  for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64}) {
+  for (const std::uint64_t beyond : {std::uint64_t{9}, kMax64 - 1, kMax64})
     EXPECT_FALSE(loadByte(bytes, beyond));
-  }
   EXPECT_FALSE(loadLittle16(bytes, 8) || loadLittle32(bytes, 6) || loadLittle64(bytes, 2));
   EXPECT_EQ(slice(bytes, 9, 0)->size(), 0U);
   EXPECT_EQ(asText(*slice(bytes, 0, 2)), "\x01\x02");
@@ -39,16 +37,13 @@ TEST(Bytes, StoresWhollyOrNotAtAll) {
 }
 
 TEST(Arithmetic, IsDefinedAtTheEnds) {
-  constexpr auto kMin = std::numeric_limits<std::int64_t>::min();
-  constexpr auto kMax = std::numeric_limits<std::int64_t>::max();
-  EXPECT_EQ(wrappingAdd(kMax, 1), kMin);
-  EXPECT_EQ(previousDay(std::numeric_limits<std::int32_t>::min()),
-            std::numeric_limits<std::int32_t>::max());
+  EXPECT_EQ(wrappingAdd(INT64_MAX, 1), INT64_MIN);
+  EXPECT_EQ(previousDay(INT32_MIN), INT32_MAX);
   EXPECT_EQ(shiftLeft(1, 64), 0U);
   EXPECT_EQ(checkedMultiply(1UL << 32, (1UL << 32) - 1), kMax64 - (1UL << 32) + 1);
   EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
   EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);
-  EXPECT_EQ(saturatingInt64(-9223372036854775808.0), kMin);
+  EXPECT_EQ(saturatingInt64(-9223372036854775808.0), INT64_MIN);
 }
 
 }  // namespace

@@ -10,9 +10,8 @@ namespace {
 TEST(Base64, RefusesWrongLengthsAndPadding) {
   std::vector<std::byte> read;
   for (const std::string_view text :
-       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="}) {
+       {"A", "AA", "AA=", "AAA", "A===", "AA==A", "AAAA=", "=", "A?=="})
     EXPECT_FALSE(readBase64(text, read)) << text;
-  }
   for (const std::size_t size : {0U, 1U, 2U, 3U, 4U, 255U}) {
     std::vector<std::byte> bytes(size);
     for (std::size_t i = 0; i < size; ++i)
@@ -27,15 +26,12 @@ TEST(Base64, RefusesWrongLengthsAndPadding) {
 TEST(Dates, AreReadAsTheyAreWritten) {
   for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
     const auto date = plist::Date::sinceEpoch(seconds);
-    const auto back = parseIsoDate(isoDateText(date));
-    ASSERT_TRUE(back) << back.error().message;
-    EXPECT_EQ(*back, date) << isoDateText(date);
+    EXPECT_EQ(*parseIsoDate(isoDateText(date)), date) << isoDateText(date);
   }
   for (const std::string_view text :
        {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
-        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"}) {
+        "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"})
     EXPECT_FALSE(parseIsoDate(text)) << text;
-  }
 }
 
 }  // namespace

@@ -28,24 +28,22 @@ TEST(Number, ComparesByValueWhateverTheKind) {
         Case(NAN, std::numeric_limits<float>::quiet_NaN(), true),
         Case((1L << 53) + 1, kTwoTo53, false), Case(1L << 53, kTwoTo53, true),
         Case(1UL << 63, kTwoTo63, true), Case(~0UL, 2 * kTwoTo63, false),
-        Case(std::numeric_limits<std::int64_t>::min(), -kTwoTo63, true),
-        Case(std::numeric_limits<std::int64_t>::min(), 1UL << 63, false),
-        Case(std::numeric_limits<std::int64_t>::max(), kTwoTo63, false), Case(~0UL, -1.0, false),
-        Case(std::numeric_limits<std::int64_t>::max(), INFINITY, false)}) {
+        Case(INT64_MIN, -kTwoTo63, true), Case(INT64_MIN, 1UL << 63, false),
+        Case(INT64_MAX, kTwoTo63, false), Case(~0UL, -1.0, false),
+        Case(INT64_MAX, INFINITY, false)}) {
     EXPECT_EQ(a == b, equal) << a.real() << " " << b.real();
     EXPECT_EQ(b == a, equal) << a.real() << " " << b.real();
   }
 }
 
 TEST(Number, ConvertsWithoutUndefinedResults) {
-  EXPECT_EQ(Number(1e300).int64(), std::numeric_limits<std::int64_t>::max());
-  EXPECT_EQ(Number(-INFINITY).int64(), std::numeric_limits<std::int64_t>::min());
-  EXPECT_EQ(Number(-kTwoTo63).int64(), std::numeric_limits<std::int64_t>::min());
-  EXPECT_EQ(Number(NAN).int64(), 0);
-  EXPECT_EQ(Number(-2.9).int64(), -2);
-  EXPECT_EQ(Number(~0UL).int64(), -1);
+  using Case = std::pair<Number, std::int64_t>;
+  for (const auto& [number, integer] :
+       {Case(1e300, INT64_MAX), Case(-INFINITY, INT64_MIN), Case(-kTwoTo63, INT64_MIN),
+        Case(NAN, 0), Case(-2.9, -2), Case(~0UL, -1)})
+    EXPECT_EQ(number.int64(), integer) << number.real();
   EXPECT_EQ(Number(~0UL).real(), 2 * kTwoTo63);
-  EXPECT_EQ(Number(0x1'8000'0001L).int32(), std::numeric_limits<std::int32_t>::min() + 1);
+  EXPECT_EQ(Number(0x1'8000'0001L).int32(), INT32_MIN + 1);
   EXPECT_EQ(Number(-1).uint32(), 0xFFFFFFFF);
 }
 
@@ -76,10 +74,9 @@ TEST(Value, EqualityLooksAtKindAndContent) {
   const Value dictionary = Dictionary{{"1", 1}}, noDictionary = Dictionary::create();
   const Value values[] = {none,  true, false,  1,     0,       "",         "1",         date,
                           epoch, data, noData, array, noArray, dictionary, noDictionary};
-  for (std::size_t i = 0; i < std::size(values); ++i) {
+  for (std::size_t i = 0; i < std::size(values); ++i)
     for (std::size_t j = 0; j < std::size(values); ++j)
       EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
-  }
   EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"b", 2.0}, {"a", 1L}}));
   EXPECT_NE(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"a", 1}, {"c", 2}}));
   EXPECT_EQ(Value(Date::sinceEpoch(NAN)), Value(Date::sinceEpoch(NAN)));
@@ -142,11 +139,10 @@ TEST(Dictionary, KeepsOrderAndContentThroughManyChanges) {
         EXPECT_EQ(dictionary.remove(key), content.erase(key) == 1);
         std::erase(order, key);
       } else {
-        if (random() % 2 == 0) {
+        if (random() % 2 == 0)
           dictionary.set(key, step);
-        } else {
+        else
           dictionary.set(String(key), step);
-        }
         if (content.insert_or_assign(key, step).second) order.push_back(key);
       }
       ASSERT_EQ(dictionary.size(), content.size());

@@ -4,7 +4,6 @@
 #include <cmath>
 #include <cstdlib>
 #include <gtest/gtest.h>
-#include <limits>
 #include <random>
 #include <string>
 
@@ -20,8 +19,7 @@ TEST(Text, WritesNumbersSoThatTheyReadBack) {
   for (const auto& [number, text] :
        {Case(0.1, "0.1"), Case(1e22, "1e+22"), Case(1e-5, "1e-05"), Case(-0.0, "-0"),
         Case(DBL_MAX, "1.7976931348623157e+308"), Case(4.9e-324, "5e-324"), Case(-INFINITY, "-inf"),
-        Case(std::copysign(NAN, -1.0), "nan"),
-        Case(std::numeric_limits<std::int64_t>::min(), "-9223372036854775808"),
+        Case(std::copysign(NAN, -1.0), "nan"), Case(INT64_MIN, "-9223372036854775808"),
         Case(~0UL, "18446744073709551615")})
     EXPECT_EQ(numberText(number), text);
   std::mt19937_64 random(3);
@@ -33,18 +31,14 @@ TEST(Text, WritesNumbersSoThatTheyReadBack) {
 
 TEST(Text, WritesObjectsAsPeopleReadThem) {
   const auto moment = plist::Date::since1970(1794852138.75);
-  const plist::Dictionary all{{"none", plist::Array::create()},
-                              {"text", "a\"b\\c\n\r\t\x01\x7f\xc3\xa4\xff"},
-                              {"yes", true},
-                              {"no", false},
-                              {"when", moment},
-                              {"bytes", plist::Data(asBytes("\x0a\xf0"))},
-                              {"empty", plist::Dictionary::create()},
-                              {"nan", NAN}};
-  EXPECT_EQ(textOf(all), R"({"none": [], "text": "a\"b\\c\n\r\t\u0001\u007f)"
-                         "\xc3\xa4\xef\xbf\xbd"
-                         R"(", "yes": 1, "no": 0, "when": "2026-11-16 18:02:18 +0000", )"
-                         R"("bytes": "<0af0>", "empty": {}, "nan": nan})");
+  const plist::Array others{
+      plist::Array::create(),      true, false, moment, plist::Data(asBytes("\x0a\xf0")),
+      plist::Dictionary::create(), NAN};
+  const plist::Dictionary all{{"text", "a\"b\\c\n\r\t\x01\x7f\xc3\xa4\xff"}, {"others", others}};
+  EXPECT_EQ(textOf(all),
+            R"({"text": "a\"b\\c\n\r\t\u0001\u007f)"
+            "\xc3\xa4\xef\xbf\xbd"
+            R"(", "others": [[], 1, 0, "2026-11-16 18:02:18 +0000", "<0af0>", {}, nan]})");
   EXPECT_EQ(textOf("plain \"text\"\n"), "plain \"text\"\n");
   EXPECT_EQ(dateText(plist::Date::since1970(-0.5)), "1969-12-31 23:59:59 +0000");
   EXPECT_EQ(dateText(plist::Date::since1970(-1e300)), "@-1e+300");
@@ -73,6 +67,10 @@ TEST(CivilTime, EveryDayOf32BitsHasADate) {
     ASSERT_GE(date.year, before.year);
     before = date;
   }
+  for (const char* text :
+       {"", "2026-2-03", "2026-02-30", "1900-02-29", "2026-13-01", "2026-01-00", "2026-01-+1",
+        "+2026-01-01", "2026-01-01 ", "02026-01-01", "-0000-01-01", "99999999999-01-01"})
+    EXPECT_FALSE(parseDate(text)) << text;
 }
 
 TEST(CivilTime, EveryInstantOf64BitsHasFields) {
@@ -83,14 +81,6 @@ TEST(CivilTime, EveryInstantOf64BitsHasFields) {
     EXPECT_EQ(secondsFromCivil(time), seconds);
   }
   EXPECT_EQ(civilFromSeconds(-1), (CivilTime{{1969, 12, 31}, 23, 59, 59}));
-}
-
-TEST(CivilTime, ReadsOnlyWhatItWrites) {
-  for (const char* text :
-       {"", "2026-2-03", "2026-02-30", "1900-02-29", "2026-13-01", "2026-01-00", "2026-01-+1",
-        "+2026-01-01", "2026-01-01 ", "02026-01-01", "-0000-01-01", "99999999999-01-01"}) {
-    EXPECT_FALSE(parseDate(text)) << text;
-  }
 }
 
 TEST(Utf8, TellsWellFormedFromMalformed) {
@@ -123,9 +113,8 @@ TEST(UuidTest, WritesAndNormalises) {
   EXPECT_EQ(normalisedUuid("00112233-4455-6677-8899-aabbccddeeff"), text);
   for (const char* other :
        {"", "00112233-4455-6677-8899-aabbccddeef", "00112233+4455-6677-8899-aabbccddeeff",
-        "0011223g-4455-6677-8899-aabbccddeeff", "00112233-4455-6677-8899aabb-ccddeeff"}) {
+        "0011223g-4455-6677-8899-aabbccddeeff", "00112233-4455-6677-8899aabb-ccddeeff"})
     EXPECT_EQ(normalisedUuid(other), std::nullopt) << other;
-  }
 }
 
 }  // namespace

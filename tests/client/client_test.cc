@@ -1,7 +1,5 @@
-// Programs record; what they leave is read back exactly.
 #include <algorithm>
 #include <csignal>
-#include <numeric>
 #include <random>
 #include <sched.h>
 #include <sys/mount.h>
@@ -27,17 +25,14 @@ void expectEachOnce(std::vector<double> values, std::uint64_t expected, std::uin
 
 TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   const pid_t child = start([] {
-    BHClientScalarKey* const count = BHClientScalarForKey("count");
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
     std::vector<std::thread> threads;
-    for (int thread = 0; thread < kThreads; ++thread) {
+    for (int thread = 0; thread < kThreads; ++thread)
       threads.emplace_back([=] {
         for (int i = 0; i < kPerThread; ++i) {
-          BHClientScalarAdd(count, 1);
-          BHClientDistributionRecord(series, thread * kPerThread + i);
+          add(1);
+          record(thread * kPerThread + i);
         }
       });
-    }
     for (std::thread& thread : threads)
       thread.join();
   });
@@ -53,31 +48,25 @@ TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
 }
 
 TEST_F(Recording, AKilledProgramLeavesEverythingItRecorded) {
-  struct Progress {
-    std::atomic<int> done;
-  };
-  Progress& progress = shared<Progress>();
+  auto& progress = shared<std::atomic<int>>();
   std::mt19937 random(12);
   const char* const rounds = std::getenv("TAVREL_KILL_ROUNDS");  // for long runs by hand
   for (int round = rounds ? std::atoi(rounds) : 200; round > 0; --round) {
     SCOPED_TRACE(round);
-    progress.done = 0;
+    progress = 0;
     scalars.clear();
     records.clear();
     const pid_t child = start([&] {
-      BHClientScalarKey* const count = BHClientScalarForKey("count");
-      BHClientScalarKey* const gauge = BHClientScalarForKey("gauge");
-      BHClientDistributionKey* const series = BHClientDistributionForKey("series");
       for (int i = 0; i < 200'000; ++i) {
-        BHClientDistributionRecord(series, i);
-        BHClientScalarAdd(count, 1);
-        BHClientScalarSet(gauge, i);
-        progress.done.store(i + 1, std::memory_order_release);
+        record(i);
+        add(1);
+        set(i);
+        progress.store(i + 1, std::memory_order_release);
       }
       pause();
     });
     const int until = static_cast<int>(random() % 3000);
-    while (progress.done < until)
+    while (progress < until)
       sched_yield();
     if (round % 2 == 0) fold();
     kill(child, SIGKILL);
@@ -85,35 +74,28 @@ TEST_F(Recording, AKilledProgramLeavesEverythingItRecorded) {
     fold();
     ASSERT_TRUE(segments().empty());
 
-    const int done = progress.done;
-    std::sort(records["series"].begin(), records["series"].end());
-    std::vector<double> expected(records["series"].size());
-    std::iota(expected.begin(), expected.end(), 0);
-    ASSERT_EQ(records["series"], expected);
-    const auto counted = static_cast<int>(expected.size());
-    ASSERT_TRUE(counted == done || counted == done + 1) << counted << " of " << done;
-    ASSERT_TRUE(scalar("count") == done || scalar("count") == done + 1) << scalar("count");
-    if (done > 0) {
-      ASSERT_TRUE(scalar("gauge") == done - 1 || scalar("gauge") == done) << scalar("gauge");
-    }
+    const std::int64_t done = progress;
+    auto& series = records["series"];
+    std::sort(series.begin(), series.end());
+    for (std::size_t i = 0; i < series.size(); ++i)
+      ASSERT_EQ(series[i], static_cast<double>(i));
+    const std::int64_t last = done > 0 ? scalar("gauge") + 1 : done;
+    for (const std::int64_t left : {std::ssize(series), scalar("count"), last})
+      ASSERT_TRUE(left == done || left == done + 1) << left << " of " << done;
   }
 }
 
 TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
   run([&] {
-    BHClientScalarKey* const count = BHClientScalarForKey("count");
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
-    BHClientScalarAdd(count, 1);
-    BHClientDistributionRecord(series, 1);
-    const std::string parents = segments().at(0);
-    const Gate recorded;
-    const Gate left;
+    add(1);
+    record(1);
+    const Gate recorded, left;
     if (fork() == 0) {
       if (fork() == 0) {
         // The middle process is a parent that ends first, as of a daemon.
         left.wait();
-        BHClientScalarAdd(count, 10);
-        BHClientDistributionRecord(series, 2);
+        add(10);
+        record(2);
         recorded.open();
         pause();
       }
@@ -139,33 +121,30 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
 
 TEST_F(Recording, EachValueBelongsToTheDayThatTheClockShows) {
   const pid_t child = start([&] {
-    BHClientScalarKey* const count = BHClientScalarForKey("count");
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
     const std::int64_t midnight = (kToday + 1) * 86'400;
     for (const std::int64_t now : {midnight - 1, midnight, midnight - 86'401, midnight + 86'399,
                                    midnight + 86'400, midnight - 1}) {
       testClock().realtime = now;
-      BHClientScalarAdd(count, 1);
-      BHClientDistributionRecord(series, static_cast<double>(now));
+      add(1);
+      record(static_cast<double>(now));
     }
     kill(getpid(), SIGSTOP);
     // The cells of the days that are over have been folded, and serve other days.
     for (const std::int64_t day : {1, 2, 1, 7}) {
       testClock().realtime = midnight + day * 86'400;
-      BHClientScalarAdd(count, 100);
+      add(100);
     }
   });
-  int status = 0;
-  waitpid(child, &status, WUNTRACED);
+  waitpid(child, nullptr, WUNTRACED);
   fold();
   kill(child, SIGCONT);
   EXPECT_EQ(waitFor(child), 0);
   const Descriptor file(open(segments().at(0).c_str(), O_RDONLY));
   EXPECT_EQ(SegmentFile(file.get()).word32(kBHHeaderCellsUsed), 4U);
   fold();
-  const std::map<std::pair<std::string, std::int32_t>, std::int64_t> expected{
-      {{"count", kToday - 1}, 1},   {{"count", kToday}, 2},       {{"count", kToday + 1}, 2},
-      {{"count", kToday + 2}, 201}, {{"count", kToday + 3}, 100}, {{"count", kToday + 8}, 100}};
+  const Scalars expected{{{"count", kToday - 1}, 1},   {{"count", kToday}, 2},
+                         {{"count", kToday + 1}, 2},   {{"count", kToday + 2}, 201},
+                         {{"count", kToday + 3}, 100}, {{"count", kToday + 8}, 100}};
   EXPECT_EQ(scalars, expected);
   for (std::size_t i = 0; i < seconds.size(); ++i)
     EXPECT_EQ(static_cast<double>(seconds[i]), records["series"][i]);
@@ -174,19 +153,16 @@ TEST_F(Recording, EachValueBelongsToTheDayThatTheClockShows) {
 
 TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
   run([] {
-    BHClientScalarKey* const count = BHClientScalarForKey("count");
-    BHClientScalarKey* const gauge = BHClientScalarForKey("gauge");
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
     for (const std::int64_t sinceBoot : {99, 100, 101}) {
       testClock().realtime = 1000 + sinceBoot;
       testClock().boot = sinceBoot;
-      BHClientScalarAdd(count, sinceBoot);
-      BHClientScalarSet(gauge, sinceBoot);
-      BHClientDistributionRecord(series, static_cast<double>(sinceBoot));
+      add(sinceBoot);
+      set(sinceBoot);
+      record(static_cast<double>(sinceBoot));
     }
     testClock().realtime = kToday * 86'400 + 2;
-    BHClientScalarAdd(count, 1000);
-    BHClientDistributionRecord(series, 1000);
+    add(1000);
+    record(1000);
   });
   boot = std::nullopt;
   fold();
@@ -196,10 +172,10 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
 
   boot = kToday * 86'400 - 100;
   fold();
-  EXPECT_EQ(scalar("count", kToday - 1), 99);
-  EXPECT_EQ(scalar("count"), 1000 + 100 + 101);
-  EXPECT_EQ(scalar("gauge", kToday - 1), 99);
-  EXPECT_EQ(scalar("gauge"), 101);
+  EXPECT_EQ(scalars, (Scalars{{{"count", kToday - 1}, 99},
+                              {{"count", kToday}, 1000 + 100 + 101},
+                              {{"gauge", kToday - 1}, 99},
+                              {{"gauge", kToday}, 101}}));
   EXPECT_EQ(seconds,
             (std::vector<std::int64_t>{*boot + 99, *boot + 100, *boot + 101, kToday * 86'400 + 2}));
   EXPECT_TRUE(segments().empty());
@@ -208,26 +184,24 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
 TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   constexpr int kRoom = kBHChunkCount * kBHChunkRecords;
   const pid_t child = start([&] {
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
     const auto isFoldWanted = [&] { return std::filesystem::exists(folder / "fold-wanted"); };
     int i = 0;
     while (!isFoldWanted() && i < kRoom)
-      BHClientDistributionRecord(series, i++);
+      record(i++);
     EXPECT_NEAR(i, kRoom * 3 / 4, 2 * kBHChunkRecords);
     std::filesystem::remove(folder / "fold-wanted");
     for (; i < kRoom + 7; ++i)
-      BHClientDistributionRecord(series, i);
+      record(i);
     EXPECT_FALSE(isFoldWanted());  // once
     const char* text = nullptr;
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusFull);
     EXPECT_STREQ(text, "the segment is full: values are dropped until the next fold");
     kill(getpid(), SIGSTOP);
     for (i = 0; i < 100; ++i)
-      BHClientDistributionRecord(series, i);
+      record(i);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
   });
-  int status = 0;
-  waitpid(child, &status, WUNTRACED);
+  waitpid(child, nullptr, WUNTRACED);
   fold();
   EXPECT_EQ(dropped, 7U);
   expectEachOnce(records["series"], kRoom, 0);
@@ -244,13 +218,11 @@ TEST_F(Recording, AFullFileSystemDropsAndCounts) {
   std::filesystem::create_directories(folder);
   if (mount("test", folder.c_str(), "tmpfs", 0, "size=128k") != 0) GTEST_SKIP() << "not root";
   run([] {
-    BHClientDistributionKey* const series = BHClientDistributionForKey("series");
     for (int i = 0; i < 20'000; ++i)
-      BHClientDistributionRecord(series, i);
+      record(i);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusFull);
     BHClientScalarAdd(BHClientScalarForKey("too much"), 1);
   });
-  const std::string left = segments().at(0);
   fold();
   EXPECT_GT(records["series"].size(), 5'000U);
   expectEachOnce(records["series"], 20'000, dropped - 1);
@@ -260,19 +232,17 @@ TEST_F(Recording, AFullFileSystemDropsAndCounts) {
 
 TEST_F(Recording, SetsAndAddsHoldInTheirOrder) {
   const pid_t child = start([] {
-    BHClientScalarKey* const gauge = BHClientScalarForKey("gauge");
-    BHClientScalarAdd(gauge, 5);
-    BHClientScalarSet(gauge, 100);
-    BHClientScalarAdd(gauge, 1);
-    kill(getpid(), SIGSTOP);
-    BHClientScalarAdd(gauge, 1);
-    kill(getpid(), SIGSTOP);
-    BHClientScalarSet(gauge, -7);
-    BHClientScalarSet(gauge, -8);
+    BHClientScalarAdd(keys().gauge, 5);
+    set(100);
+    for (int i = 0; i < 2; ++i) {
+      BHClientScalarAdd(keys().gauge, 1);
+      kill(getpid(), SIGSTOP);
+    }
+    set(-7);
+    set(-8);
   });
-  int status = 0;
   for (const std::int64_t expected : {101, 1102}) {
-    waitpid(child, &status, WUNTRACED);
+    waitpid(child, nullptr, WUNTRACED);
     fold();
     EXPECT_EQ(scalar("gauge"), expected);
     scalar("gauge") += 1000;  // from another program
@@ -283,72 +253,61 @@ TEST_F(Recording, SetsAndAddsHoldInTheirOrder) {
   EXPECT_EQ(scalar("gauge"), -8);
 }
 
-BHClientDistributionKey* handlerSeries;
-BHClientScalarKey* handlerCount;
 std::atomic<int> handled;
 
 TEST_F(Recording, SignalHandlersRecord) {
-  struct Totals {
-    int recorded;
-  };
-  Totals& totals = shared<Totals>();
+  int& recorded = shared<int>();
   run([&] {
-    handlerSeries = BHClientDistributionForKey("series");
-    handlerCount = BHClientScalarForKey("count");
+    keys();
     // The first value of the process may be a handler's, in the middle of another first value.
     std::signal(SIGALRM, [](int) {
       for (int i = 0; i < 3; ++i)
-        BHClientDistributionRecord(handlerSeries, handled++);
-      BHClientScalarAdd(handlerCount, 3);
+        record(handled++);
+      add(3);
     });
     const itimerval often{{0, 30}, {0, 1}};
     setitimer(ITIMER_REAL, &often, nullptr);
     int own = 0;
     for (; handled < 3000 && own < 150'000; ++own) {
-      BHClientDistributionRecord(handlerSeries, 1'000'000 + own);
-      BHClientScalarAdd(handlerCount, 1);
+      record(1'000'000 + own);
+      add(1);
     }
     std::signal(SIGALRM, SIG_IGN);
-    totals.recorded = handled + own;
+    recorded = handled + own;
   });
   fold();
   EXPECT_EQ(dropped, 0U);
-  EXPECT_EQ(scalar("count"), totals.recorded);
+  EXPECT_EQ(scalar("count"), recorded);
   auto& values = records["series"];
-  EXPECT_EQ(values.size(), static_cast<std::size_t>(totals.recorded));
+  EXPECT_EQ(values.size(), static_cast<std::size_t>(recorded));
   std::sort(values.begin(), values.end());
   EXPECT_EQ(std::adjacent_find(values.begin(), values.end()), values.end());
 }
 
 TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
   std::filesystem::create_directories("/tmp/tavrel-client-test/run/tavrel/stat");
-  const struct {
-    const char* root;
-    BHClientStatus status;
-    const char* text;
-  } cases[] = {
+  const std::tuple<const char*, BHClientStatus, const char*> cases[] = {
       {"/dev/shm/tavrel-absent/", BHClientStatusNoFolder,
        "the device has no folder /run/tavrel/stat: nothing is recorded"},
       {"/tmp/tavrel-client-test", BHClientStatusNotInMemory,
        "/run/tavrel/stat is not on a tmpfs: nothing is recorded"},
       {root.c_str(), BHClientStatusRecording, "values are recorded"},
   };
-  for (const auto& each : cases) {
+  for (const auto& [device, status, text] : cases) {
     run([&] {
-      setenv("TAVREL_ROOT", each.root, 1);
+      setenv("TAVREL_ROOT", device, 1);
       EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusNoKey);
-      BHClientScalarKey* const count = BHClientScalarForKey("count");
-      BHClientDistributionKey* const series = BHClientDistributionForKey("series");
+      keys();
       errno = 77;
       for (int i = 0; i < 3; ++i) {
-        BHClientScalarAdd(count, 1);
-        BHClientScalarSet(count, 1);
-        BHClientDistributionRecord(series, 1);
-        BHClientTimerStopSeconds(BHClientTimerStart(), series);
+        add(1);
+        set(1);
+        record(1);
+        BHClientTimerStopSeconds(BHClientTimerStart(), keys().series);
       }
-      const char* text = nullptr;
-      EXPECT_EQ(BHClientGetStatus(&text), each.status);
-      EXPECT_STREQ(text, each.text);
+      const char* said = nullptr;
+      EXPECT_EQ(BHClientGetStatus(&said), status);
+      EXPECT_STREQ(said, text);
       EXPECT_EQ(errno, 77);
     });
   }
@@ -386,7 +345,7 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
 TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
   const Gate recorded;
   const pid_t child = start([&] {
-    BHClientScalarAdd(BHClientScalarForKey("count"), 1);
+    add(1);
     recorded.open();
     for (int descriptor = 3; descriptor < 1000; ++descriptor)
       close(descriptor);
@@ -411,15 +370,13 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
 }
 
 TEST_F(Recording, AnExecutedProgramIsNoWriter) {
-  int ends[2];
-  ASSERT_EQ(pipe(ends), 0);
+  const Gate executed;
   const pid_t child = start([&] {
-    BHClientScalarAdd(BHClientScalarForKey("count"), 1);
-    dup2(ends[1], 1);
+    add(1);
+    dup2(executed.opener(), 1);
     execlp("sh", "sh", "-c", "echo; exec sleep 1000", nullptr);
   });
-  char byte;
-  ASSERT_EQ(read(ends[0], &byte, 1), 1);
+  executed.wait();
   EXPECT_EQ(writerOf(segments().at(0)), SegmentWriter::Gone);
   kill(child, SIGKILL);
   waitFor(child);

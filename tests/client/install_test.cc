@@ -1,5 +1,3 @@
-// What is installed builds the examples of the documentation, through pkg-config and as a CMake
-// package; the shared library offers its own names only, and needs nothing but libc.
 #include <cstdlib>
 
 #include "recording.h"
@@ -23,15 +21,12 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
   outputOf("cmake --install " TAVREL_BUILD " --component brimhold --prefix " + to);
   const std::string pc = outputOf("find " + to + " -name brimhold.pc");
   const std::string lib = std::filesystem::path(pc).parent_path().parent_path();
-  const std::string flags = outputOf(
-      "PKG_CONFIG_PATH=" + lib + "/pkgconfig pkg-config --define-prefix --cflags --libs brimhold");
-  const std::string warnings = " -Wall -Wextra -Wpedantic -Werror ";
-  std::string line = "cc -std=c11" + warnings + examples + "/record.c -o " + to + "/c " + flags;
-  line.pop_back();
-  outputOf(line + " " TAVREL_LINK_FLAGS);
-  line = "c++ -std=c++20" + warnings + examples + "/record.cc -o " + to + "/cpp " + flags;
-  line.pop_back();
-  outputOf(line + " " TAVREL_LINK_FLAGS);
+  std::string flags = outputOf("PKG_CONFIG_PATH=" + lib +
+                               "/pkgconfig pkg-config --define-prefix --cflags --libs brimhold");
+  flags.pop_back();
+  flags += " -Wall -Wextra -Wpedantic -Werror " TAVREL_LINK_FLAGS;
+  outputOf("cc -std=c11 " + examples + "/record.c -o " + to + "/c " + flags);
+  outputOf("c++ -std=c++20 " + examples + "/record.cc -o " + to + "/cpp " + flags);
   outputOf("cmake -S " + examples + " -B " + to + "/build -DCMAKE_PREFIX_PATH=" + to +
            " -DCMAKE_EXE_LINKER_FLAGS='" TAVREL_LINK_FLAGS "' && cmake --build " + to + "/build");
   for (const char* program : {"/c", "/cpp", "/build/record", "/build/record_cpp"})

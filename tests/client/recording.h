@@ -1,5 +1,4 @@
-// Programs that record, as children of the test; clocks that the test sets; and a store in memory
-// that folds what they leave.
+// Children that record, clocks that the test sets, and a store in memory that folds.
 #pragma once
 
 #include <atomic>
@@ -25,8 +24,7 @@ namespace tavrel {
 
 inline constexpr std::int64_t kToday = 25'000;  // a day after any build
 
-/// What clock_gettime shows in this program, in seconds; 0 leaves a clock alone. In memory that
-/// children share.
+/// The seconds that clock_gettime shows here and in children; 0 leaves a clock alone.
 struct TestClock {
   std::atomic<std::int64_t> realtime;
   std::atomic<std::int64_t> boot;
@@ -63,6 +61,7 @@ inline void run(const std::function<void()>& program) {
 class Gate {
  public:
   Gate() { EXPECT_EQ(pipe2(ends_, O_CLOEXEC), 0); }
+  int opener() const { return ends_[1]; }
   void open() const { EXPECT_EQ(write(ends_[1], "x", 1), 1); }
   void wait() const {
     char byte;
@@ -71,6 +70,12 @@ class Gate {
 
  private:
   int ends_[2];
+};
+
+struct Keys {
+  BHClientScalarKey* count = BHClientScalarForKey("count");
+  BHClientScalarKey* gauge = BHClientScalarForKey("gauge");
+  BHClientDistributionKey* series = BHClientDistributionForKey("series");
 };
 
 /// A device whose /run is on a tmpfs, and its store.
@@ -88,9 +93,14 @@ class Recording : public testing::Test, public SegmentSink {
     seconds.push_back(record.day * std::int64_t{86'400} + record.secondsInDay);
   }
 
+  /// The keys of the programs, once they are looked up in the process, and values for them.
+  static const Keys& keys();
+  static void add(std::int64_t amount) { BHClientScalarAdd(keys().count, amount); }
+  static void set(std::int64_t value) { BHClientScalarSet(keys().gauge, value); }
+  static void record(double value) { BHClientDistributionRecord(keys().series, value); }
+
   std::vector<std::string> segments() const;
-  /// Reads all segments on from where the last fold ended, acknowledges, and removes those that are
-  /// done. Positions go through their bytes.
+  /// Reads all segments on, with positions as bytes; acknowledges, and removes what is done.
   void fold();
   SegmentWriter writerOf(const std::string& segment) const;
 
@@ -101,11 +111,11 @@ class Recording : public testing::Test, public SegmentSink {
   std::filesystem::path root;
   std::filesystem::path folder;
   BootInstant boot = 0;
-  std::map<std::pair<std::string, std::int32_t>, std::int64_t> scalars;
+  using Scalars = std::map<std::pair<std::string, std::int32_t>, std::int64_t>;  // by key and day
+  Scalars scalars;
   std::map<std::string, std::vector<double>> records;
   std::vector<std::int64_t> seconds;
   std::uint64_t dropped = 0;
-  std::uint64_t refused = 0;
   std::map<std::string, std::string> positions;
 };
 

@@ -122,10 +122,9 @@ TEST_F(BHConfigTest, YieldsNothingForAFileThatCannotBeUsed) {
 // Against the plain definition, over prefixes that nest, branch and share beginnings.
 TEST(PrefixTreeTest, FindsWhatAWalkOverAllPrefixesFinds) {
   std::vector<std::string> texts{""};
-  for (std::size_t i = 0; texts.size() < 364; ++i) {
+  for (std::size_t i = 0; texts.size() < 364; ++i)
     for (const char c : {'a', 'b', '\xFF'})
       texts.push_back(texts[i] + c);
-  }
   for (unsigned step = 1; step < 8; ++step) {
     std::vector<std::string> prefixes;
     for (std::size_t i = step - 1; i < texts.size(); i += step)
@@ -133,11 +132,9 @@ TEST(PrefixTreeTest, FindsWhatAWalkOverAllPrefixesFinds) {
     const PrefixTree tree(prefixes);
     for (const std::string& key : texts) {
       std::optional<std::string> expected;
-      for (const std::string& prefix : prefixes) {
-        if (key.starts_with(prefix) && (!expected || prefix.size() > expected->size())) {
+      for (const std::string& prefix : prefixes)
+        if (key.starts_with(prefix) && (!expected || prefix.size() > expected->size()))
           expected = prefix;
-        }
-      }
       ASSERT_EQ(tree.longestMatch(key), expected) << key;
     }
   }

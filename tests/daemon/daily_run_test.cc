@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <gtest/gtest.h>
-#include <limits>
 
 #include "base/version.h"
 #include "daemon/entry.h"
@@ -12,30 +11,31 @@
 namespace tavrel {
 namespace {
 
+using plist::Array;
 using plist::Dictionary;
 using Messages = std::vector<std::string>;
 using std::chrono_literals::operator""ms;
 
 constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
+const std::string kNeverCame = "never received requested AAI, so moving along without it";
 const std::string kNotPermitted = "no log for day 19999: diagnostic submission not allowed";
 
-// What every run says of a device that has no storage to ask.
-const std::string kNoStorage =
-    "error reading nand info, error 1 with message Unable to parse buffer";
+const std::string kUnread = "error reading nand info, error 1 with message Unable to parse buffer";
 
 const std::string kTotal = "scalar com.norvane.lumenhall.DiskUsageUserTotalBlocks";
 const std::string kFree = "scalar com.norvane.lumenhall.DiskUsageUserBlocksFree";
 const fakes::Journal kTasks{"checkpoint", kTotal, kFree, "clean structured logs",
                             "roll support log"};
+const std::string kOwn = "set com.norvane.tallied.tavrel ";
 const fakes::Journal kGatedTasks{"checkpoint",
                                  kTotal,
                                  kFree,
                                  "clean structured logs",
                                  "roll support log",
                                  "checkpoint",
-                                 "set com.norvane.tallied.tavrel LastLogOutcome",
-                                 "set com.norvane.tallied.tavrel " + std::string(kDayKey),
+                                 kOwn + "LastLogOutcome",
+                                 kOwn + kDayKey,
                                  "synchronize com.norvane.tallied.tavrel"};
 
 struct DailyRunTest : ::testing::Test {
@@ -59,8 +59,7 @@ TEST_F(DailyRunTest, RunsOncePerDay) {
   runDailyIfNeeded(fake.platform, {});
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(storedDay(), plist::Value(19999));
-  EXPECT_EQ(fake.log.messages(),
-            (Messages{"daily tasks for day 19999", kNotPermitted, kNoStorage}));
+  EXPECT_EQ(fake.log.messages(), (Messages{"daily tasks for day 19999", kNotPermitted, kUnread}));
 
   fake.journal.clear();
   runDailyIfNeeded(fake.platform, {});
@@ -79,9 +78,8 @@ TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
 TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
   fake.systemVersion.version = {{kProductBuildVersionKey, "21A5"}};
   dailyTasksForDay(fake.platform, 19999, {});
-  EXPECT_EQ(fake.journal,
-            (fakes::Journal{"checkpoint", kTotal, kFree, "clean structured logs",
-                            "set com.norvane.tallied.tavrel LastOSUpdate", "roll support log"}));
+  EXPECT_EQ(fake.journal, (fakes::Journal{"checkpoint", kTotal, kFree, "clean structured logs",
+                                          kOwn + "LastOSUpdate", "roll support log"}));
 }
 
 // An absent day reads as 0, later than the day before 1970, and 2^40 as its low half, 0; the
@@ -91,8 +89,7 @@ TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
   for (const auto& [stored, today, runs] :
        {Case({}, 0, false), Case({}, 2, true), Case(-5, 0, true), Case(20001, 20000, false),
         Case("19999", 20000, true), Case(std::int64_t{1} << 40, 20000, true),
-        Case(std::numeric_limits<std::int32_t>::max(), 20000, false),
-        Case(20000, std::numeric_limits<std::int32_t>::min(), true)}) {
+        Case(INT32_MAX, 20000, false), Case(20000, INT32_MIN, true)}) {
     fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);
     fake.store.today = today;
     fake.journal.clear();
@@ -102,22 +99,13 @@ TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
 }
 
 TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
-  struct Case {
-    plist::Value stored;
-    std::int32_t today;
-    const char* days;  // that are said to be missing
-  };
+  // The last column is the days that are said to be missing.
+  using Case = std::tuple<plist::Value, std::int32_t, std::string>;
   for (const auto& [stored, today, days] :
-       std::vector<Case>{{{}, 20000, ""},
-                         {"19000", 20000, ""},
-                         {19998, 20000, ""},
-                         {19997, 20000, "1 (19998 to 19998)"},
-                         {16339, 20000, "3659 (16340 to 19998)"},
-                         {16338, 20000, ""},
-                         {-3, 2, "3 (-2 to 0)"},
-                         {std::int64_t{1} << 40, 20000, ""},
-                         {std::numeric_limits<std::int64_t>::min(), 20000, ""},
-                         {0, std::numeric_limits<std::int32_t>::min(), ""}}) {
+       {Case({}, 20000, ""), Case("19000", 20000, ""), Case(19998, 20000, ""),
+        Case(19997, 20000, "1 (19998 to 19998)"), Case(16339, 20000, "3659 (16340 to 19998)"),
+        Case(16338, 20000, ""), Case(-3, 2, "3 (-2 to 0)"), Case(std::int64_t{1} << 40, 20000, ""),
+        Case(INT64_MIN, 20000, ""), Case(0, INT32_MIN, "")}) {
     fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);
     fake.store.today = today;
     fake.log.entries.clear();
@@ -125,8 +113,8 @@ TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
     Messages info = fake.log.messages(LogLevel::Info);
     ASSERT_FALSE(info.empty());
     info.pop_back();  // why there is no log
-    const std::string text = std::string("days without a run that will not be reported: ") + days;
-    EXPECT_EQ(info, *days ? Messages{text} : Messages{}) << textOf(stored) << " on " << today;
+    const std::string text = "days without a run that will not be reported: " + days;
+    EXPECT_EQ(info, days.empty() ? Messages{} : Messages{text}) << textOf(stored) << " " << today;
   }
 }
 
@@ -138,34 +126,31 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
     runDailyIfNeeded(fake.platform, {});
     return fake.log.messages(LogLevel::Info).back();
   };
-  const auto outcome = [this] {
-    return fake.preferences.domain(kTavrelDomain).get("LastLogOutcome");
-  };
+  const Dictionary& own = fake.preferences.domain(kTavrelDomain);
   fake.submission.enabled = true;
   EXPECT_EQ(run(1), "no log for day 1: no usable whitelist");
-  EXPECT_EQ(outcome(), plist::Value("no-whitelist"));
+  EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("no-whitelist"));
   fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
   EXPECT_EQ(run(2), "no log for day 2: no value found for any whitelisted key");
   run(3);
-  EXPECT_EQ(std::ranges::count(fake.journal, "set com.norvane.tallied.tavrel LastLogOutcome"), 0);
+  EXPECT_EQ(std::ranges::count(fake.journal, kOwn + "LastLogOutcome"), 0);
   fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}};
   EXPECT_EQ(run(4), "writing tallied log. yesterday=4");
-  EXPECT_EQ(outcome(), plist::Value("filed"));
+  EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("filed"));
   fake.submission.fails = true;
   EXPECT_EQ(run(5), "writing tallied log. yesterday=5");
-  EXPECT_EQ(outcome(), plist::Value("not-filed"));
+  EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("not-filed"));
 }
 
 TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
   fake.store.scalars = {{"k", 19999, 1}};
   fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
-  dailyTasksForDay(fake.platform, 19999, {});
+  const Array apps{Dictionary{{"bundle", "a"}}};
+  dailyTasksForDay(fake.platform, 19999, apps);
   EXPECT_EQ(fake.journal, kTasks);
-  EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{kNotPermitted});
 
   fake.submission.enabled = true;
   fake.journal.clear();
-  const plist::Array apps{Dictionary{{"bundle", "a"}}};
   dailyTasksForDay(fake.platform, 19999, apps);
   EXPECT_EQ(fake.journal.front(), "checkpoint");
   EXPECT_EQ(fake.submission.lastLog().get("BHActivatedAppInfo"), plist::Value(apps));
@@ -176,7 +161,7 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   run({"tavrel", "-d", "-t"});
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "daily tasks for day 19999",
-                                           kNotPermitted, kNoStorage, "tavrel ended"}));
+                                           kNotPermitted, kUnread, "tavrel ended"}));
 
   run({"tavrel", "-f"});
   EXPECT_EQ(fake.journal, kTasks);
@@ -203,24 +188,23 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
 }
 
 TEST_F(DailyRunTest, ServesUntilASliceHasPassedWithoutAnEvent) {
-  run({"tavrel"});
-  EXPECT_EQ(fake.eventLoop.slices, std::vector{5ms});
-  EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
-
-  fake.eventLoop.slices.clear();
+  for (const bool listens : {false, true}) {
+    fake.services.available = listens;
+    run({"tavrel"});
+    EXPECT_EQ(fake.eventLoop.slices, std::vector{5ms});
+    EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
+    fake.eventLoop.slices.clear();
+  }
   fake.eventLoop.events = {[] {}, [this] { fake.state.appInfoRequested = true; }, [] {}};
   run({"tavrel"});
   EXPECT_EQ(fake.eventLoop.slices.size(), 4U);
   EXPECT_EQ(fake.journal, kGatedTasks);
-  EXPECT_EQ(fake.log.messages()[1], "never received requested AAI, so moving along without it");
+  EXPECT_EQ(fake.log.messages()[1], kNeverCame);
 }
 
 TEST_F(DailyRunTest, GoesOnBehindAnException) {
-  struct : DriverRegistry {
+  struct : fakes::FakeRegistry {
     std::shared_ptr<DriverService> firstService(std::string_view) override {
-      throw std::bad_alloc();
-    }
-    KernelReturn matchingServices(const Dictionary&, std::unique_ptr<ServiceIterator>&) override {
       throw std::bad_alloc();
     }
   } failing;
@@ -231,8 +215,7 @@ TEST_F(DailyRunTest, GoesOnBehindAnException) {
   }};
   run({"tavrel"});
   EXPECT_EQ(fake.log.messages(),
-            (Messages{"tavrel started", "cannot go on serving: the message",
-                      "never received requested AAI, so moving along without it",
+            (Messages{"tavrel started", "cannot go on serving: the message", kNeverCame,
                       "daily tasks for day 19999", kNotPermitted,
                       "cannot finish the storage statistics: std::bad_alloc", "tavrel ended"}));
   EXPECT_EQ(fake.journal, kGatedTasks);

@@ -26,7 +26,6 @@ struct TaskingTest : ::testing::Test {
     fake.preferences.domain("com.norvane.Drovelink") = {{"ScheduledTasking", tasking}};
   }
 
-  /// What one run does and says.
   Journal track() {
     fake.journal.clear();
     fake.log.entries.clear();
@@ -43,10 +42,6 @@ TEST_F(TaskingTest, NotesAnOSUpdate) {
 
   EXPECT_EQ(track(), Journal{});
 
-  fake.systemVersion.version = {{kProductBuildVersionKey, "21B1"}};
-  track();
-  EXPECT_EQ(fake.log.messages(), Messages{"OS change since last run (21A5 -> 21B1)"});
-
   fake.systemVersion.version = {};
   EXPECT_EQ(track(), Journal{});
 }
@@ -57,16 +52,11 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
                       Dictionary{{"Domain", "no key"}}, "no setting"};
   schedule({{"TaskingID", "one"}, {"TaskingDigest", 7}, {"TaskingPayload", payload}});
 
-  const Journal applied{"set b k",
-                        "set a k",
-                        "set b l",
-                        "set com.norvane.tallied.tavrel TaskingID",
-                        "set com.norvane.tallied.tavrel TaskingOS",
-                        "set com.norvane.tallied.tavrel TaskingDigest",
-                        "set com.norvane.tallied.tavrel TaskingPayload",
-                        "synchronize a",
-                        "synchronize b",
-                        "synchronize com.norvane.tallied.tavrel",
+  const std::string set = "set com.norvane.tallied.tavrel Tasking";
+  const Journal applied{"set b k", "set a k", "set b l",
+                        // Then what it takes to undo them.
+                        set + "ID", set + "OS", set + "Digest", set + "Payload", "synchronize a",
+                        "synchronize b", "synchronize com.norvane.tallied.tavrel",
                         "post com.norvane.da.tasking_changed"};
   EXPECT_EQ(track(), applied);
   EXPECT_EQ(fake.log.messages(), Messages{});
@@ -81,11 +71,10 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
   const Journal again = track();
   EXPECT_EQ(fake.log.messages(), (Messages{"OS change since last run (21A5 -> 21B1)",
                                            "Tasking update (one -> one, 21A5 -> 21B1)"}));
+  const std::string remove = "remove com.norvane.tallied.tavrel Tasking";
   EXPECT_EQ(Journal(again.begin() + 1, again.begin() + 7),
-            (Journal{"remove b k", "remove a k", "remove b l",
-                     "remove com.norvane.tallied.tavrel TaskingID",
-                     "remove com.norvane.tallied.tavrel TaskingDigest",
-                     "remove com.norvane.tallied.tavrel TaskingPayload"}));
+            (Journal{"remove b k", "remove a k", "remove b l", remove + "ID", remove + "Digest",
+                     remove + "Payload"}));
   EXPECT_EQ(Journal(again.begin() + 7, again.end()), applied);
   EXPECT_EQ(own.get("TaskingOS"), plist::Value("21B1"));
 
@@ -119,42 +108,22 @@ TEST_F(TaskingTest, AppliesNothingThatItCouldNotUndo) {
   EXPECT_EQ(track().back(), "post com.norvane.da.tasking_changed");
 }
 
-TEST_F(TaskingTest, SynchronisesEachDomainOnce) {
-  own = {{"LastOSUpdate", Dictionary{{"version", "21A5"}, {"day", 1}}}};
-  Array payload = Array::create();
-  for (int i = 0; i < 5000; ++i)
-    payload.append(setting(format("domain.%d", i % 1000).c_str(), format("%d", i).c_str(), i));
-  schedule({{"TaskingID", "many"}, {"TaskingPayload", payload}});
-  const Journal journal = track();
-  std::map<std::string, int> synchronised;
-  for (const std::string& call : journal) {
-    if (call.starts_with("synchronize")) ++synchronised[call];
-  }
-  EXPECT_EQ(synchronised.size(), 1001U);
-  for (const auto& [call, count] : synchronised)
-    EXPECT_EQ(count, 1) << call;
-  EXPECT_EQ(journal[journal.size() - 2], "synchronize com.norvane.tallied.tavrel");
-}
-
 TEST_F(TaskingTest, SubmitsAtOnceForSomeDaysAfterAnUpdate) {
-  // The first column is the value of "AggressiveSubmissionDays".
   using Case = std::tuple<plist::Value, plist::Value, std::int32_t, const char*>;
-  for (const auto& [days, updateDay, today, message] :
-       {Case(3, 100, 100, "Aggressive submission day 0 of 3; triggering log submission"),
-        Case(3, 100, 102, "Aggressive submission day 2 of 3; triggering log submission"),
-        Case(3, 100, 103, nullptr),
-        Case(3, 100, 98, "Aggressive submission day 2 of 3; triggering log submission"),
-        Case(3, {}, 1, "Aggressive submission day 1 of 3; triggering log submission"),
-        Case({}, 100, 100, nullptr), Case("3", 100, 100, nullptr), Case(-1, 100, 100, nullptr),
-        Case(2147483647, std::numeric_limits<std::int32_t>::min(), 2147483647, nullptr)}) {
-    Dictionary update{{"version", "21A5"}};
-    update.set("day", updateDay);
+  for (const auto& [days, updateDay, today, day] :
+       {Case(3, 100, 100, "0"), Case(3, 100, 102, "2"), Case(3, 100, 103, nullptr),
+        Case(3, 100, 98, "2"), Case(3, {}, 1, "1"), Case({}, 100, 100, nullptr),
+        Case("3", 100, 100, nullptr), Case(-1, 100, 100, nullptr),
+        Case(INT32_MAX, INT32_MIN, INT32_MAX, nullptr)}) {
+    const Dictionary update{{"version", "21A5"}, {"day", updateDay}};
     own = {{"LastOSUpdate", update}, {"TaskingID", "one"}, {"TaskingOS", "21A5"}};
     schedule({{"TaskingID", "one"}});
     fake.store.today = today;
     fake.submission.taskingValues.set("AggressiveSubmissionDays", days);
-    EXPECT_EQ(track(), message ? Journal{"submit now"} : Journal{}) << today;
-    EXPECT_EQ(fake.log.messages(), message ? Messages{message} : Messages{});
+    EXPECT_EQ(track(), day ? Journal{"submit now"} : Journal{}) << today;
+    const std::string text = format("Aggressive submission day %s of 3", day);
+    EXPECT_EQ(fake.log.messages(),
+              day ? Messages{text + "; triggering log submission"} : Messages{});
   }
   // Without a scheduled tasking, or one without an identifier, nothing is submitted either.
   fake.store.today = 100;

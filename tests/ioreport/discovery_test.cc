@@ -29,9 +29,8 @@ TEST(DiscoveryTest, ReadsLegendsAsFarAsTheyAreSound) {
     return driver;
   };
   const auto publishing = [&](const Value& isPublic) {
-    const Dictionary properties{{"IOReportLegend", Array{kSound}},
-                                {"IOReportLegendPublic", isPublic}};
-    return with("Properties", properties);
+    return with("Properties",
+                Dictionary{{"IOReportLegend", Array{kSound}}, {"IOReportLegendPublic", isPublic}});
   };
   const std::string kBad = "e00002bc " + kNoText;
   const std::tuple<Dictionary, const char*, std::string> kCases[] = {
@@ -68,8 +67,7 @@ TEST(DiscoveryTest, ReadsLegendsAsFarAsTheyAreSound) {
   }
   EXPECT_FALSE(IOReportCopyChannelsForDriver(nullptr, 0, nullptr));
 
-  // Of all drivers only those are found whose property is true. Those that fail are printed when
-  // that is asked for, and the others are still there.
+  // Drivers that fail are printed when that is asked for; the others are still found.
   const Array services{driverOf("bad", 17, Array{channelsOf({Array{"x", 1}})}), publishing(1),
                        driverOf("worse", 18, 5), legend(Array{kSound})};
   const std::string kPrinted = "bad <id 0x11>: " + kNoText + "\nworse <id 0x12>: bad legend\n";
@@ -105,16 +103,16 @@ TEST(DiscoveryTest, FilesChannelsByDriverGroupAndSubgroup) {
   const Dictionary plain = channelOf(7, 1, 1);
   const Dictionary nameless{{"LegendChannel", Array{1, 1}}, {"IOReportGroupName", "G"}};
   const Dictionary empty = Dictionary::create();
-  const std::tuple<Dictionary, Dictionary, std::int32_t, KernelReturn> kCases[] = {
-      {{}, plain, 0, kKernelBadArgument},
-      {empty, {}, 0, kKernelBadArgument},
-      {aggregateOf("text"), plain, 0, kKernelError},
-      {{{"IOReportDrivers", 1}}, plain, 1, kKernelError},
-      {empty, nameless, 1, kKernelError},
-      {in("IOReportChannelGroups", "G", {}), nameless, 2, kKernelSuccess},
-      {{{"IOReportChannelGroups", Dictionary{{"G", 1}}}}, nameless, 2, kKernelError},
-      {empty, plain, 2, kKernelSuccess}};  // it has no group
-  for (const auto& [aggregate, added, options, code] : kCases) {
+  const Dictionary noGroups{{"IOReportChannelGroups", Dictionary{{"G", 1}}}};
+  using Case = std::tuple<Dictionary, Dictionary, std::int32_t, KernelReturn>;
+  for (const auto& [aggregate, added, options, code] :
+       {Case({}, plain, 0, kKernelBadArgument), Case(empty, {}, 0, kKernelBadArgument),
+        Case(aggregateOf("text"), plain, 0, kKernelError),
+        Case({{"IOReportDrivers", 1}}, plain, 1, kKernelError),
+        Case(empty, nameless, 1, kKernelError), Case(noGroups, nameless, 2, kKernelError),
+        // A group's table is made; without a group the channel stands at the top.
+        Case(in("IOReportChannelGroups", "G", {}), nameless, 2, kKernelSuccess),
+        Case(empty, plain, 2, kKernelSuccess)}) {
     Failure failure;
     EXPECT_EQ(_addChannel(aggregate, added, options, failure), code);
     EXPECT_EQ(failure.text(), code ? format("%x _addChannel() failed", code) : "none");
@@ -129,15 +127,15 @@ TEST(DiscoveryTest, CopiesFromMatchingDriversAllOrNone) {
   const Dictionary disk = driverOf("disk", 7, Array{kSound});
   const Dictionary bare{{"Class", "Driver"}};
   const Dictionary found = channelOf(7, 0x41, 0);
-  const std::tuple<Array, Dictionary, std::string, std::string> kCases[] = {
-      {{disk, disk}, kMatching, "cc", "none"},
-      {{disk}, {}, "", "e00002c2 no matching dict"},
-      {{disk, driverOf("e", 8, {})}, kMatching, "", "e00002f0 no legend"}};
-  for (const auto& [services, matching, names, text] : kCases) {
+  using Case = std::tuple<Array, Dictionary, std::string, std::string>;
+  for (const auto& [services, matching, names, text] :
+       {Case({disk, disk}, kMatching, "cc", "none"),
+        Case({disk}, {}, "", "e00002c2 no matching dict"),
+        Case({disk, driverOf("e", 8, {})}, kMatching, "", "e00002f0 no legend")}) {
     Drivers drivers(services);
     Failure failure;
-    EXPECT_EQ(namesIn(IOReportCopyChannelsForDrivers(drivers.registry, matching, 3, failure)),
-              names);
+    const auto copy = IOReportCopyChannelsForDrivers(drivers.registry, matching, 3, failure);
+    EXPECT_EQ(namesIn(copy), names);
     EXPECT_EQ(failure.text(), text);
   }
   const std::tuple<Array, Dictionary, std::uint64_t, Array, std::string> kByID[] = {
@@ -171,13 +169,11 @@ TEST(DiscoveryTest, StopsWalksThatFailOrThatTheRegistryChangedUnder) {
   fakes::FakeProcess process;
   EXPECT_EQ(IOReportCopyCurrentProcessName(process), "tavrel <pid 211>");
 
+  const ErrorObject bare{.code = 5, .failureReason = {}};
   const std::tuple<std::int32_t, Text, std::optional<ErrorObject>, std::string_view> kPrints[] = {
       {INT32_MAX, "f", createCFErr(1, "why"), ""},
       {INT32_MIN, "f", createCFErr(1, "why"), "f: why\n"},
-      {-1,
-       {},
-       ErrorObject{.code = 5, .failureReason = {}},
-       "<unknown> function: KernelReturn error 0x5\n"},
+      {-1, {}, bare, "<unknown> function: KernelReturn error 0x5\n"},
       {-1, "f", createCFErr(1, "\xff"), "f: <unknown> error\n"}};  // no UTF-8: no error object
   for (const auto& [options, name, error, printed] : kPrints) {
     fakes::FakeStreams streams;

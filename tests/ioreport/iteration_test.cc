@@ -29,43 +29,31 @@ Dictionary letters(std::string_view text) {
   return aggregate;
 }
 
-struct WalkCase {
-  std::vector<IterateResult> answers;
-  std::string_view seen;
-  IterateResult result;
-  std::string_view left = "abcdef";
-};
-
-ChannelCallback answering(const WalkCase& row, std::string& seen) {
-  return [&](const Dictionary& channel) {
-    seen += IOReportChannelGetChannelName(channel).value_or("?");
-    return row.answers[(seen.size() - 1) % row.answers.size()];
-  };
-}
-
+// A walk and a pruning see the same channels; the last column is what the pruning leaves.
 TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
+  using Case = std::tuple<std::vector<IterateResult>, std::string, IterateResult, std::string>;
   for (const bool isTree : {false, true}) {
-    const auto make = [&] {
-      return isTree ? treeOf({"d-a", "dgb", "dgc", "e-d", "f-e", "f-f"}) : letters("abcdef");
-    };
-    for (const auto& row : {WalkCase({0}, "abcdef", 0), WalkCase({0, 2, 0, 4}, "abcdef", 6),
-                            WalkCase({0, 0, 1, 0}, "abc", 1), WalkCase({2, 3}, "ab", 3),
-                            WalkCase({16}, "abcdef", 16), WalkCase({0, -1, 2}, "ab", -1)}) {
-      std::string seen;
-      EXPECT_EQ(IOReportIterate(make(), answering(row, seen)), row.result);
-      EXPECT_EQ(seen, row.seen);
-    }
-    for (const auto& row :
-         {WalkCase({16}, "abcdef", 16, ""), WalkCase({0}, "abcdef", 0), WalkCase({2}, "abcdef", 2),
-          WalkCase({16, 0}, "abcdef", 16, "bdf"), WalkCase({0, 16, 16}, "abcdef", 16, "ad"),
-          WalkCase({16, 2, 16, 1}, "abcd", 1, "bdef"), WalkCase({16, 17}, "ab", 17, "bcdef")}) {
-      std::string seen;
-      const Dictionary pruned = make();
-      EXPECT_EQ(IOReportPrune(pruned, answering(row, seen)), row.result);
-      EXPECT_EQ(seen, row.seen);
-      EXPECT_EQ(namesIn(pruned), row.left);
-      EXPECT_EQ(IOReportGetChannelCount(pruned), static_cast<std::int32_t>(row.left.size()));
-      EXPECT_EQ(pruned.size(), row.left.empty() ? 1U : 2U);  // the options, and what is left
+    for (const auto& [answers, expected, result, left] :
+         {Case({0}, "abcdef", 0, "abcdef"), Case({0, 2, 0, 4}, "abcdef", 6, "abcdef"),
+          Case({0, 0, 1, 0}, "abc", 1, "abcdef"), Case({2, 3}, "ab", 3, "abcdef"),
+          Case({0, -1, 2}, "ab", -1, "abcdef"), Case({16}, "abcdef", 16, ""),
+          Case({16, 0}, "abcdef", 16, "bdf"), Case({0, 16, 16}, "abcdef", 16, "ad"),
+          Case({16, 2, 16, 1}, "abcd", 1, "bdef"), Case({16, 17}, "ab", 17, "bcdef")}) {
+      for (const auto walk : {IOReportIterate, IOReportPrune}) {
+        const Dictionary aggregate =
+            isTree ? treeOf({"d-a", "dgb", "dgc", "e-d", "f-e", "f-f"}) : letters("abcdef");
+        std::string seen;
+        const auto answer = [&](const Dictionary& channel) {
+          seen += IOReportChannelGetChannelName(channel).value_or("?");
+          return answers[(seen.size() - 1) % answers.size()];
+        };
+        EXPECT_EQ(walk(aggregate, answer), result);
+        EXPECT_EQ(seen, expected);
+        const std::string rest = walk == IOReportPrune ? left : "abcdef";
+        EXPECT_EQ(namesIn(aggregate), rest);
+        EXPECT_EQ(IOReportGetChannelCount(aggregate), static_cast<std::int32_t>(rest.size()));
+        EXPECT_EQ(aggregate.size(), rest.empty() ? 1U : 2U);  // the options, and what is left
+      }
     }
   }
 }

@@ -1,4 +1,3 @@
-// Channels, samples and recorded drivers for the tests of the reporting client.
 #pragma once
 
 #include <array>
@@ -32,7 +31,6 @@ inline void append(std::vector<std::byte>& bytes, std::initializer_list<std::uin
   }
 }
 
-/// One element's four values, and its time.
 struct Element {
   std::array<std::int64_t, 4> values{};
   std::uint64_t time = 0;
@@ -79,13 +77,11 @@ inline Dictionary channelIn(const Dictionary& aggregate, std::size_t index = 0) 
   return aggregate.array("IOReportChannels").at(index).dictionary();
 }
 
-/// A service that publishes a legend.
 inline Dictionary driverOf(const char* name, std::int64_t entryID, const Value& legend) {
   const Dictionary properties{{"IOReportLegendPublic", true}, {"IOReportLegend", legend}};
   return {{"Class", "Driver"}, {"Name", name}, {"EntryID", entryID}, {"Properties", properties}};
 }
 
-/// A registry that plays these services.
 struct Drivers {
   explicit Drivers(const Array& services, const Value& hub = {})
       : recording{{"Services", services}, {"Hub", hub}} {}

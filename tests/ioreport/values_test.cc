@@ -48,10 +48,10 @@ TEST(ValuesTest, ReadsWhatIsOfItsFormatAndThere) {
   brief.set("RawElements", plist::Data(brief.data("RawElements").bytes().first(63)));
   const Sample four{{{0, 1, 2, 3}}, {{4, 5, 6, 7}}, {{8, 9, 10, 11}}, {{0, 12, 13, 14}}};
   const Sample states{{{5, 10, 1}, 5}, {{6, 11, 3}, 9}, {{5, 12, 0}, 9}};
-  const std::string kNoArray = " |----------| ";
+  const std::string kNoArray = "- |----------| ";
   const std::string kNoBuckets = " - - ----- ----- ----- ----- | ";
-  const std::string kNoStates = " -1 -1 ----- ----- -----";
-  const std::string kNothing = "-" + kNoArray + "-1" + kNoBuckets + "-1" + kNoStates;
+  const std::string kNoStates = "-1 -1 -1 ----- ----- -----";
+  const std::string kNothing = kNoArray + "-1" + kNoBuckets + kNoStates;
   const std::pair<Dictionary, std::string> kCases[] = {
       {{}, kNothing},
       {brief, kNothing},
@@ -60,15 +60,14 @@ TEST(ValuesTest, ReadsWhatIsOfItsFormatAndThere) {
       // The type's count matters to histograms and states only.
       {typed(sampleOf(1, {{{-5}}}), typeOf(1, 9)), "-5" + kNothing.substr(1)},
       {sampleOf(4, {{{10, 11, 12, 13}}, {{14, 15, 16, 17}}}),
-       "- |-1011121314151617-| -1" + kNoBuckets + "-1" + kNoStates},
-      {sampleOf(3, four), "-" + kNoArray + "4 5 10 -0480 -15912 -261013 -371114 | -1" + kNoStates},
-      {typed(sampleOf(3, four), typeOf(3, 5)),
-       "-" + kNoArray + "5" + kNoBuckets + "-1" + kNoStates},
-      {sampleOf(3, {{}, {}}), "-" + kNoArray + "2 - - -00-- -00-- -00-- -00-- | -1" + kNoStates},
-      {sampleOf(2, states), "-" + kNoArray + "-1" + kNoBuckets + "3 1 2 -565- -101112- -130-"},
+       "- |-1011121314151617-| -1" + kNoBuckets + kNoStates},
+      {sampleOf(3, four), kNoArray + "4 5 10 -0480 -15912 -261013 -371114 | " + kNoStates},
+      {typed(sampleOf(3, four), typeOf(3, 5)), kNoArray + "5" + kNoBuckets + kNoStates},
+      {sampleOf(3, {{}, {}}), kNoArray + "2 - - -00-- -00-- -00-- -00-- | " + kNoStates},
+      {sampleOf(2, states), kNoArray + "-1" + kNoBuckets + "3 1 2 -565- -101112- -130-"},
       {typed(sampleOf(2, states), typeOf(2, 2)),
-       "-" + kNoArray + "-1" + kNoBuckets + "2" + kNoStates},
-      {sampleOf(2, {{}}), "-" + kNoArray + "-1" + kNoBuckets + "1 -1 -1 -0--- -0--- -0---"}};
+       kNoArray + "-1" + kNoBuckets + "2" + kNoStates.substr(2)},
+      {sampleOf(2, {{}}), kNoArray + "-1" + kNoBuckets + "1 -1 -1 -0--- -0--- -0---"}};
   for (const auto& [channel, readings] : kCases)
     EXPECT_EQ(readingsOf(channel), readings);
 
@@ -91,7 +90,6 @@ TEST(ValuesTest, ComparesResidenciesUnsigned) {
   EXPECT_TRUE(std::isnan(IOReportStateGetDutyCycle(sampleOf(2, {{}, {}}), 0)));
 }
 
-// Only the low 16 bits of the number of elements count.
 TEST(ValuesTest, CountsElementsIn16Bits) {
   const Dictionary most = sampleOf(2, Sample(65535, Element{{1, 2, 3, 4}, 1}));
   EXPECT_EQ(IOReportStateGetResidency(most, 65534), 3);
@@ -138,8 +136,7 @@ TEST(ValuesTest, WorksOutBucketBounds) {
     std::int64_t expectedLower = 0;
     for (std::size_t i = 0; i < bounds.size(); ++i) {
       const std::int64_t expectedUpper = bounds.at(i).number()->int64();
-      std::int64_t lower = -1;
-      std::int64_t upper = -1;
+      std::int64_t lower = -1, upper = -1;
       const auto bucket = static_cast<std::int32_t>(i);
       EXPECT_EQ(IOReportHistogramGetBucketBounds(channel, bucket, &lower, &upper), 0U);
       EXPECT_EQ(lower, std::exchange(expectedLower, expectedUpper));
@@ -207,17 +204,16 @@ TEST(UnitTest, WorksOutEveryPairOfExponents) {
   const auto exponentOf = [](std::uint32_t byte) {
     return byte == 0 ? 0 : byte == 255 ? -128 : static_cast<int>(byte) - 127;
   };
+  using Case = std::tuple<std::uint32_t, std::uint64_t, std::uint64_t>;
   for (std::uint32_t scale = 0; scale <= 0xFFFF; ++scale) {
     const int tens = exponentOf(scale & 0xFF);
     const int twos = exponentOf(scale >> 8);
-    for (const std::uint32_t word : {0U, 7U, 0x80000007U, 0x80000000U}) {
-      const std::uint64_t factor = (word & 0x7FFFFFFF) != 0 ? word & 0x7FFFFFFF : 1;
-      const bool divides = word >> 31 != 0;
-      std::uint64_t up = 99;
-      std::uint64_t down = 99;
+    for (const auto& [word, factor, divisor] :
+         {Case(0, 1, 1), Case(7, 7, 1), Case(0x80000007, 1, 7), Case(0x80000000, 1, 1)}) {
+      std::uint64_t up = 99, down = 99;
       ASSERT_EQ(getFactorsFromScale(word, scale, up, down), kKernelSuccess);
-      ASSERT_EQ(up, scaled(divides ? 1 : factor, tens, twos)) << scale;
-      ASSERT_EQ(down, scaled(divides ? factor : 1, -tens, -twos)) << scale;
+      ASSERT_EQ(up, scaled(factor, tens, twos)) << scale;
+      ASSERT_EQ(down, scaled(divisor, -tens, -twos)) << scale;
     }
   }
 }
@@ -304,9 +300,9 @@ struct FakeWriter : DescriptorWriter {
 
 TEST(DescriptionTest, WritesTextsWithOneCall) {
   FakeWriter writer;
-  const std::pair<std::ptrdiff_t, KernelReturn> kCases[] = {
-      {4, 0}, {3, kKernelUnderrun}, {5, kKernelError}, {-1, kKernelIOError}};
-  for (const auto& [answer, code] : kCases) {
+  using Case = std::pair<std::ptrdiff_t, KernelReturn>;
+  for (const auto& [answer, code] :
+       {Case(4, 0), Case(3, kKernelUnderrun), Case(5, kKernelError), Case(-1, kKernelIOError)}) {
     writer.answer = answer;
     EXPECT_EQ(IOReportWriteStringUTF8(writer, 1, "text\0more"s), code);
     EXPECT_EQ(writer.written, "text");

@@ -1,4 +1,3 @@
-// Reading when memory is short.
 #include <cstdlib>
 #include <gtest/gtest.h>
 #include <limits>

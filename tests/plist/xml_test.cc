@@ -54,23 +54,18 @@ TEST(Xml, WritesSortedIndentedDocument) {
 TEST(Xml, ScalarsAreWrittenAndReadBack) {
   using Case = std::pair<Value, std::string>;
   for (const auto& [value, text] :
-       {Case(std::numeric_limits<std::int64_t>::min(), "<integer>-9223372036854775808</integer>"),
-        Case(std::numeric_limits<std::uint64_t>::max(), "<integer>18446744073709551615</integer>"),
+       {Case(INT64_MIN, "<integer>-9223372036854775808</integer>"),
+        Case(UINT64_MAX, "<integer>18446744073709551615</integer>"),
         Case(0.1F, "<real>0.10000000149011612</real>"), Case(-0.0, "<real>-0</real>"),
         Case(5e-324, "<real>5e-324</real>"),
         Case(-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"),
-        Case(Date::ofDay(std::numeric_limits<std::int32_t>::min()),
-             "<date>-5877641-06-23T00:00:00Z</date>"),
+        Case(Date::ofDay(INT32_MIN), "<date>-5877641-06-23T00:00:00Z</date>"),
         Case(Data(asBytes("ab")), "<data>\nYWI=\n</data>"),
         Case(Data(asBytes("a")), "<data>\nYQ==\n</data>"),
         Case(Data(ByteSpan()), "<data>\n</data>"), Case(" \t\n\r ", "<string> \t\n&#13; </string>"),
         Case("\xF0\x9F\x98\x80\x7F\xC2\x85", "<string>\xF0\x9F\x98\x80\x7F\xC2\x85</string>")}) {
-    const auto xml = writeXml(value);
-    ASSERT_TRUE(xml) << text;
-    EXPECT_EQ(*xml, wrapped(text + "\n"));
-    const auto back = readXml(asBytes(*xml));
-    ASSERT_TRUE(back) << back.error().message;
-    EXPECT_EQ(*back, value) << text;
+    EXPECT_EQ(*writeXml(value), wrapped(text + "\n"));
+    EXPECT_EQ(*readXml(asBytes(wrapped(text + "\n"))), value) << text;
   }
   EXPECT_TRUE(std::signbit(readXml(asBytes(wrapped("<real>-0</real>")))->number()->real()));
 }
@@ -114,10 +109,8 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
       {Value(cyclic),
        "cannot encode the property list: containers nest deeper than 128, or one contains itself"},
       {large, "cannot encode the property list: the document is longer than 67108864 bytes"}};
-  for (const auto& [value, error] : rows) {
-    const auto xml = writeXml(value);
-    EXPECT_EQ(xml ? "no error" : xml.error().message, error);
-  }
+  for (const auto& [value, error] : rows)
+    EXPECT_EQ(writeXml(value).error().message, error);
   cyclic.remove(1);
   EXPECT_EQ(*readXml(asBytes(*writeXml(deepest))), Value(deepest));
 }
@@ -135,11 +128,8 @@ TEST(Xml, ReadsWhatOthersWrite) {
   std::string utf16 = "\xFF\xFE";
   for (const char character : body)
     utf16 += {character, '\0'};
-  for (const std::string& document : {latin, utf16}) {
-    const auto value = readXml(asBytes(document));
-    ASSERT_TRUE(value) << value.error().message;
-    EXPECT_EQ(*value, Value(expected));
-  }
+  for (const std::string& document : {latin, utf16})
+    EXPECT_EQ(*readXml(asBytes(document)), Value(expected));
   const auto twice = readXml(asBytes(wrapped(
       "<dict><key>a</key><true/><key>a</key><integer>9223372036854775808</integer></dict>")));
   EXPECT_EQ(*twice, Value(Dictionary{{"a", std::uint64_t{1} << 63}}));
@@ -147,7 +137,6 @@ TEST(Xml, ReadsWhatOthersWrite) {
 }
 
 TEST(Xml, ErrorsSayWhatAndWhere) {
-  // The reasons follow "line 3, column ".
   const std::pair<std::string, std::string> rows[] = {
       {"", "1: <plist> holds no value"},
       {"<true/><true/>", "8: <true> is a second value"},
@@ -165,10 +154,8 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
       {"<date>2026-02-29T00:00:00Z</date>",
        "27: \"2026-02-29T00:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
       {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"}};
-  for (const auto& [body, reason] : rows) {
-    const std::string error = errorOf(wrapped(body));
-    EXPECT_EQ(error, "XML property list, line 3, column " + reason) << body;
-  }
+  for (const auto& [body, reason] : rows)
+    EXPECT_EQ(errorOf(wrapped(body)), "XML property list, line 3, column " + reason) << body;
   EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
             "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is no integer of 64 bits");
   EXPECT_EQ(errorOf("<dict/>"),

@@ -39,7 +39,6 @@ TEST(HistogramTest, SearchesAsTheWalkDoes) {
   for (const plist::Array& list : kLists) {
     const auto histogram = Histogram::create(list);
     ASSERT_TRUE(histogram);
-    // At every boundary of any list, and beside it.
     for (const plist::Array& others : kLists) {
       for (const plist::Value& boundary : others) {
         const double at = boundary.number() ? boundary.number()->real() : 0;

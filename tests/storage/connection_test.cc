@@ -9,21 +9,12 @@
 namespace tavrel {
 namespace {
 
-using fakes::answering;
-using fakes::Bytes;
-using fakes::driver;
-using fakes::little32;
-using fakes::request;
-using fakes::statistics;
-using fakes::StoragePlatform;
-using plist::Array;
-using plist::Data;
-using plist::Dictionary;
+using namespace fakes;
 
 constexpr const char* kNVMe = "NorvaneEmbeddedNVMeController";
 constexpr const char* kCloseFailed = "Could not close connection to service\n";
 
-Dictionary with(const Dictionary& dictionary, const char* key, const plist::Value& value) {
+Dictionary with(const Dictionary& dictionary, const char* key, const Value& value) {
   auto copy = plist::mutableCopy(dictionary);
   copy.set(key, value);
   return copy;
@@ -48,8 +39,7 @@ TEST(ConnectionTest, FetchesStatistics) {
     StoragePlatform platform(services);
     const NandExporter* exporter = nullptr;
     ASPContext context;
-    EXPECT_EQ(fetchStatistics(platform.drivers, platform.streams, exporter, context), result)
-        << error;
+    EXPECT_EQ(fetchStatistics(platform.drivers, platform.streams, exporter, context), result);
     EXPECT_EQ(platform.streams.error, error);
     EXPECT_EQ(platform.streams.output, "");
     EXPECT_EQ(context.hostWrites, hostWrites) << error;
@@ -91,17 +81,16 @@ TEST(ConnectionTest, EncodesRequests) {
 TEST(ConnectionTest, OpensConnections) {
   const std::string noService = "Can't get ASP Connection, no matching service!\n";
   const Dictionary good = driver({});
-  using Case = std::tuple<Array, bool, std::string>;
-  const Case kCases[] = {Case({}, false, noService), Case({good}, true, ""),
-                         Case({with(good, "OpenError", kKernelError)}, false,
-                              "IOServiceOpen failed for class 'ASPStorage', result 0xe00002bc\n"
-                              "Can't get ASP Connection!\n")};
-  for (const auto& [services, opens, error] : kCases) {
+  const std::string failed =
+      "IOServiceOpen failed for class 'ASPStorage', result 0xe00002bc\nCan't get ASP Connection!\n";
+  using Case = std::pair<Array, std::string>;
+  for (const auto& [services, error] : {Case({}, noService), Case({good}, ""),
+                                        Case({with(good, "OpenError", kKernelError)}, failed)}) {
     StoragePlatform platform(services);
     ASPConnection connection;
     closeASPConnection(connection);
-    EXPECT_EQ(openASPConnection(platform.drivers, platform.streams, connection), opens);
-    EXPECT_EQ(connection.service != nullptr, opens);
+    EXPECT_EQ(openASPConnection(platform.drivers, platform.streams, connection), error.empty());
+    EXPECT_EQ(connection.service != nullptr, error.empty());
     for (int i = 0; i < 2; ++i) {
       closeASPConnection(connection);
       EXPECT_TRUE(!connection.service && !connection.connection);

@@ -7,18 +7,15 @@
 namespace tavrel {
 namespace {
 
-using fakes::Bytes;
-using fakes::StoragePlatform;
-using plist::Array;
-using plist::Dictionary;
-using plist::Value;
+using namespace fakes;
 
 using Scalars = std::vector<std::pair<std::string, std::int64_t>>;
+const std::string kUnread = "error reading nand info, error 1 with message Unable to parse buffer";
 
-Scalars scalarsOf(const StoragePlatform& platform) {
+Scalars scalarsOf(const FakePlatform& platform, std::string_view prefix = {}) {
   Scalars scalars;
   for (const auto& [key, day, value] : platform.store.scalars)
-    scalars.emplace_back(key, value);
+    if (key.starts_with(prefix)) scalars.emplace_back(key, value);
   return scalars;
 }
 
@@ -37,48 +34,39 @@ TEST(DailyStatisticsTest, ReportsDiskUsageInMebibytes) {
     EXPECT_EQ(scalarsOf(platform),
               (Scalars{{"com.norvane.lumenhall.DiskUsageUserTotalBlocks", capacity},
                        {"com.norvane.lumenhall.DiskUsageUserBlocksFree", available}}));
-    EXPECT_EQ(platform.log.messages(),
-              (std::vector<std::string>{
-                  "error reading nand info, error 1 with message Unable to parse buffer"}));
+    EXPECT_EQ(platform.log.messages(), Journal{kUnread});
     EXPECT_TRUE(platform.crashReporting.records.empty());
   }
 }
 
 TEST(DailyStatisticsTest, SetsTheNumbersOfTheNandInformation) {
-  const Bytes buffer =
-      fakes::statistics({{53, {0x20001}}, {7, {~std::uint64_t{0}}}, {56, {0}}, {52, {12}}});
-  StoragePlatform platform({fakes::driver(fakes::answering(buffer))});
+  const Bytes buffer = statistics({{53, {0x20001}}, {7, {~0UL}}, {56, {0}}, {52, {12}}});
+  StoragePlatform platform({driver(answering(buffer))});
   dailyStorageStatistics(platform.platform);
   const Scalars scalars = scalarsOf(platform);
   ASSERT_EQ(scalars.size(), 2U + 15U);
-  EXPECT_EQ(scalars[2],
-            std::pair(std::string("com.norvane.NANDInfo.ExportVersion"), std::int64_t{0x20001}));
-  EXPECT_EQ(scalars[8],
-            std::pair(std::string("com.norvane.NANDInfo.NumLogicalReads"), std::int64_t{-1}));
+  EXPECT_EQ((Scalars{scalars[2], scalars[8]}),
+            (Scalars{{"com.norvane.NANDInfo.ExportVersion", 0x20001},
+                     {"com.norvane.NANDInfo.NumLogicalReads", -1}}));
   EXPECT_TRUE(platform.log.messages().empty());
 }
 
 TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
   const auto event = [](std::uint8_t id, std::uint8_t registers) {
-    Bytes bytes(8);
-    bytes[0] = std::byte{id};
-    bytes[1] = std::byte{registers};
+    Bytes bytes;
+    append64(bytes, id | registers << 8U);
     for (std::uint64_t i = 0; i < 8; ++i)
-      fakes::append64(bytes, i == 0 ? ~std::uint64_t{0} : i);
+      append64(bytes, i == 0 ? ~0UL : i);
     return bytes;
   };
-  const auto unexpected = [](int number) {
-    return std::vector<std::string>{
-        "error reading nand info, error 1 with message Unable to parse buffer",
-        format("Unexpected errno (%d) reading ECC events from kernel", number)};
-  };
-  const std::tuple<std::size_t, int, std::size_t, std::size_t, std::vector<std::string>> kCases[] =
-      {{0, 2, 0, 0, {unexpected(0)[0]}},
-       {3, 16, 3, 0, {unexpected(0)[0]}},
-       {1, 5, 1, 0, unexpected(5)},
-       {10, 2, 10, 0, {unexpected(0)[0]}},
-       {12, 2, 10, 1, unexpected(0)}};
-  for (const auto& [pending, errorBehind, logged, left, messages] : kCases) {
+  // The last column is the number that is logged as unexpected, -1 for none.
+  using Case = std::tuple<std::size_t, int, std::size_t, std::size_t, int>;
+  for (const auto& [pending, errorBehind, logged, left, number] :
+       {Case(0, 2, 0, 0, -1), Case(3, 16, 3, 0, -1), Case(1, 5, 1, 0, 5), Case(10, 2, 10, 0, -1),
+        Case(12, 2, 10, 1, 0)}) {
+    Journal messages{kUnread};
+    if (number >= 0)
+      messages.push_back(format("Unexpected errno (%d) reading ECC events from kernel", number));
     StoragePlatform platform(Array{});
     for (std::size_t i = 0; i < pending; ++i)
       platform.controls.eccEvents.push_back(
@@ -91,11 +79,10 @@ TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
     EXPECT_EQ(platform.log.messages(), messages);
     if (logged < 3) continue;
     EXPECT_EQ(records[0].first, 172U);
-    EXPECT_EQ(records[0].second, (Dictionary{{"id", 0}, {"count", 0}}));
-    EXPECT_EQ(records[1].second, (Dictionary{{"id", 1}, {"count", 1}, {"reg0", -1}}));
-    EXPECT_EQ(records[2].second.size(), 2U + 8U);
-    EXPECT_EQ(records[2].second.get("count"), Value(8));
-    EXPECT_EQ(records[2].second.get("reg7"), Value(7));
+    EXPECT_EQ(
+        textOf(records[0].second) + textOf(records[1].second) + textOf(records[2].second),
+        R"({"id": 0, "count": 0}{"id": 1, "count": 1, "reg0": -1}{"id": 2, "count": 8, )"
+        R"("reg0": -1, "reg1": 1, "reg2": 2, "reg3": 3, "reg4": 4, "reg5": 5, "reg6": 6, "reg7": 7})");
   }
 }
 
@@ -106,32 +93,23 @@ TEST(DailyStatisticsTest, SetsSimpleChannelsOfTheStorageCategory) {
   const Array channels{Array{1, kSimple, "reads"}, Array{2, kHistogram, "sizes"},
                        Array{3, kOtherCategory, "other"}, Array{4, kSimple | 0x0300 << 16},
                        Array{5, kSimple, "left out"}};
-  const auto elements = [](std::uint64_t channel, std::int64_t type, std::int64_t value) {
+  const auto elements = [](std::int64_t channel, std::int64_t type, std::int64_t value) {
     Bytes bytes;
-    for (const std::uint64_t word :
-         {std::uint64_t{9}, channel, static_cast<std::uint64_t>(type), std::uint64_t{1},
-          static_cast<std::uint64_t>(value), std::uint64_t{0}, std::uint64_t{0}, std::uint64_t{0}})
-      fakes::append64(bytes, word);
-    const auto id = static_cast<std::int64_t>(channel);
-    return Dictionary{{"DriverID", 9}, {"ChannelID", id}, {"Elements", plist::Data(bytes)}};
+    for (const std::int64_t word : {9L, channel, type, 1L, value, 0L, 0L, 0L})
+      append64(bytes, static_cast<std::uint64_t>(word));
+    return Dictionary{{"DriverID", 9}, {"ChannelID", channel}, {"Elements", Data(bytes)}};
   };
-  const Dictionary reporter{
-      {"Class", "Reporter"},
-      {"EntryID", 9},
-      {"Properties",
-       Dictionary{{"IOReportLegendPublic", true},
-                  {"IOReportLegend", Array{Dictionary{{"IOReportChannels", channels}}}}}}};
+  const Array legend{Dictionary{{"IOReportChannels", channels}}};
+  const Dictionary properties{{"IOReportLegendPublic", true}, {"IOReportLegend", legend}};
+  const Dictionary reporter{{"Class", "Reporter"}, {"EntryID", 9}, {"Properties", properties}};
   const Dictionary hub{
       {"Channels", Array{elements(1, kSimple, 77), elements(2, kHistogram, 5),
                          elements(3, kOtherCategory, 6), elements(4, kSimple | 0x0300 << 16, -8)}}};
-  fakes::FakePlatform platform;
+  FakePlatform platform;
   RecordedRegistry registry({{"Services", Array{reporter}}, {"Hub", hub}}, platform.log);
   platform.drivers.behind = &registry;
   dailyStorageStatistics(platform.platform);
-  Scalars scalars;
-  for (const auto& [key, day, value] : platform.store.scalars)
-    if (key.starts_with("com.norvane.ioreport.")) scalars.emplace_back(key, value);
-  EXPECT_EQ(scalars,
+  EXPECT_EQ(scalarsOf(platform, "com.norvane.ioreport."),
             (Scalars{{"com.norvane.ioreport.reads", 77}, {"com.norvane.ioreport.(null)", -8}}));
   EXPECT_EQ(platform.streams.output, "");
 }

@@ -23,8 +23,8 @@ std::string item(std::uint32_t type, std::uint64_t flags, std::string_view paylo
 // Items from words: "(1" and ")1" begin and end container 1, "nABC" is a thread name ("*" stands
 // for a zero byte), "s7" IO statistics, "-" ones without the counter, "a" an array item, "?" an
 // item that is cut, "." the end of the buffer, "x" an unfinished begin.
-std::string items(const std::string& words) {
-  std::istringstream stream(words);
+std::string items(const std::string& described) {
+  std::istringstream stream(described);
   std::string out;
   for (std::string word; stream >> word;) {
     std::string rest = word.substr(1);
@@ -48,42 +48,38 @@ std::string items(const std::string& words) {
 
 TEST(VMFreezer, FindsTheThreadsWrites) {
   // What was written, empty for an error.
-  static constexpr std::pair<const char*, std::string_view> kCases[] = {
-      {"(1 (2 nVM_swapout s123456 )2 )1", "123456"},
-      {"(1 nVM_swapout s18446744073709551615 )1", "18446744073709551615"},
-      {"(1 s5 (2 nVM_swapout )2 )1", "0"},  // its own figures only
-      {"(1 nVM_swapout (2 s9 )2 )1", "0"},
-      {"(1 nVM_swapout -", ""},
-      {"(1 )1 (2 nVM_swapout )2", ""},
-      {"(1 (3 nx )3 (2 nVM_swapout s1 )2 )1", "1"},
-      {"nVM_swapout s5 )0 x a (1 nVM_swapout a s8 )1", "8"},
-      {"(1 )2 nVM_swapout s8", "8"},
-      {"(1 (1 )1 nVM_swapout s4 )1", "4"},
-      {"(1 nVM_swapout nother )1", ""},
-      {"(1 nVM_swapout s1 s2", "2"},
-      {"(1 nVM_swapout****************************************************** )1", "0"},
-      {"(1 nVM_swapout1* )1", ""},
-      {"(1 nVM_s )1", "0"},
-      {"(1 n s3 )1", "3"},
-      {"(1 nVM_swapout (2 nother ? )2 )1", "0"},  // ends every level
-      {"(1 (2 nother . nVM_swapout s6 )1", "6"},  // ends one level
-      {". (1 nVM_swapout )1", ""},
-      {"", ""}};
+  using Case = std::pair<std::string_view, std::vector<const char*>>;
+  const Case kCases[] = {
+      {"123456", {"(1 (2 nVM_swapout s123456 )2 )1"}},
+      {"18446744073709551615", {"(1 nVM_swapout s18446744073709551615 )1"}},
+      {"1", {"(1 (3 nx )3 (2 nVM_swapout s1 )2 )1"}},
+      {"8", {"nVM_swapout s5 )0 x a (1 nVM_swapout a s8 )1", "(1 )2 nVM_swapout s8"}},
+      {"4", {"(1 (1 )1 nVM_swapout s4 )1"}},
+      {"2", {"(1 nVM_swapout s1 s2"}},
+      {"3", {"(1 n s3 )1"}},
+      // An item that is cut ends every level, the end of the buffer one.
+      {"6", {"(1 (2 nother . nVM_swapout s6 )1"}},
+      {"0",
+       {"(1 nVM_swapout (2 nother ? )2 )1", "(1 s5 (2 nVM_swapout )2 )1",
+        "(1 nVM_swapout (2 s9 )2 )1",
+        "(1 nVM_swapout****************************************************** )1", "(1 nVM_s )1"}},
+      {"",
+       {"(1 nVM_swapout -", "(1 )1 (2 nVM_swapout )2", "(1 nVM_swapout nother )1",
+        "(1 nVM_swapout1* )1", ". (1 nVM_swapout )1", ""}}};
   fakes::FakeSnapshots snapshots;
   const auto copied = [&] { return textOf(CopyVMFreezerNANDInfo(snapshots)); };
   const std::string error =
-      "{\"com.norvane.NANDInfo.VMFreezer.Error\": \"1\", "
-      "\"com.norvane.NANDInfo.VMFreezer.ErrorMessage\": "
-      "\"Unable parse snapshot for VMFreezer NAND writes.\"}";
-  for (const auto& [described, writes] : kCases) {
-    const std::string content = items(described);
-    snapshots.content.assign(asBytes(content).begin(), asBytes(content).end());
-    EXPECT_EQ(copied(),
-              writes.empty()
-                  ? error
-                  : format("{\"com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites\": %s}", writes))
-        << described;
-    EXPECT_EQ(snapshots.flags, 0x10000U);
+      R"({"com.norvane.NANDInfo.VMFreezer.Error": "1", "com.norvane.NANDInfo.VMFreezer.ErrorMessage": )"
+      R"("Unable parse snapshot for VMFreezer NAND writes."})";
+  for (const auto& [writes, descriptions] : kCases) {
+    const std::string found =
+        format("{\"com.norvane.NANDInfo.VMFreezer.NumPhysicalWrites\": %s}", writes);
+    for (const char* const described : descriptions) {
+      const std::string content = items(described);
+      snapshots.content.assign(asBytes(content).begin(), asBytes(content).end());
+      EXPECT_EQ(copied(), writes.empty() ? error : found) << described;
+      EXPECT_EQ(snapshots.flags, 0x10000U);
+    }
   }
   for (bool* step :
        {&snapshots.hasBuffer, &snapshots.captures, &snapshots.takesFlags, &snapshots.creates}) {

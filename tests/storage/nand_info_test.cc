@@ -12,14 +12,8 @@
 namespace tavrel {
 namespace {
 
-using fakes::answering;
-using fakes::driver;
-using fakes::Record;
-using fakes::statistics;
-using fakes::StoragePlatform;
-using plist::Dictionary;
+using namespace fakes;
 
-/// What a driver with such statistics is told to be.
 Dictionary infoOf(const std::vector<Record>& records) {
   StoragePlatform platform({driver(answering(statistics(records)))});
   return CopyNANDInfo(platform.platform);
@@ -62,29 +56,30 @@ TEST(NandInfoTest, SetsFixedFiguresInTheirOrder) {
 
 TEST(NandInfoTest, ReadsStatistics) {
   const std::uint64_t kEpoch = 946684800;
-  const std::tuple<std::vector<Record>, const char*, std::optional<std::int64_t>> kCases[] = {
-      {{{56, {kEpoch}}}, "formatDaysSince2000", 0},
-      {{{56, {kEpoch + 604799}}}, "formatDaysSince2000", 0},
-      {{{56, {1}}}, "formatDaysSince2000", 0},
-      {{{56, {~0ULL}}}, "formatDaysSince2000", 30500568903377},
-      {{{86, {500}}}, "IntermediatePartitionSize", std::nullopt},
-      {{{86, {500}}, {85, {0xFFFFFFFF}}}, "IntermediatePartitionSize", std::nullopt},
-      {{{86, {500}}, {85, {501}}}, "IntermediatePartitionSize", -1},
-      {{{86, {5}}, {85, {1}}, {86, {~0ULL}}}, "IntermediatePartitionSize", -2},
-      {{{269, {5, 100}}, {270, {~0ULL, 1}}, {269, {9}}}, "NumMaintenanceRequests", 4},
-      {{{289, {1, 7, 0, 9}}}, "MaintenanceRequestsFailedRead", 2},
-      {{{290, {1, 7, 1, 9}}}, "MaintenanceRequestsFailedProg", 3},
-      {{{291, {0, 0, 8, 9}}}, "MaintenanceRequestsFailedErase", 1},
-      {{{187, {~0ULL}}}, "numMemExtreme", -1},
-      {{{144, {5}}}, "numMemExtreme", std::nullopt},
-      {{{188, {1ULL << 32}}}, "maxMemExtremeDuration", 0},
-      {{{142, {12345}}}, "maxMemChokeDuration", 12300},
-      {{{145, {12345}}}, "maxMemExtremeDuration", std::nullopt},
-      {{{143, {12345}}}, "memChokeDuration", 12345},
-      {{{121, {1, 2, 3, 4}}}, "PadSize1", 1},
-      {{{114, {1, 2, 3, 4, 5}}}, "BandsPerInternalFlow3", 5},
-      {{{77, {1}}, {77, {2}}}, "StaticDataSizeInMB", 2}};
-  for (const auto& [own, suffix, value] : kCases) {
+  constexpr const char* kFormat = "formatDaysSince2000";
+  constexpr const char* kIntermediate = "IntermediatePartitionSize";
+  const std::optional<std::int64_t> none;
+  using Case = std::tuple<std::vector<Record>, const char*, std::optional<std::int64_t>>;
+  for (const auto& [own, suffix, value] :
+       {Case({{56, {kEpoch}}}, kFormat, 0), Case({{56, {kEpoch + 604799}}}, kFormat, 0),
+        Case({{56, {1}}}, kFormat, 0), Case({{56, {~0ULL}}}, kFormat, 30500568903377),
+        // None without both figures.
+        Case({{86, {500}}}, kIntermediate, none),
+        Case({{86, {500}}, {85, {0xFFFFFFFF}}}, kIntermediate, none),
+        Case({{86, {500}}, {85, {501}}}, kIntermediate, -1),
+        Case({{86, {5}}, {85, {1}}, {86, {~0ULL}}}, kIntermediate, -2),
+        Case({{269, {5, 100}}, {270, {~0ULL, 1}}, {269, {9}}}, "NumMaintenanceRequests", 4),
+        Case({{289, {1, 7, 0, 9}}}, "MaintenanceRequestsFailedRead", 2),
+        Case({{290, {1, 7, 1, 9}}}, "MaintenanceRequestsFailedProg", 3),
+        Case({{291, {0, 0, 8, 9}}}, "MaintenanceRequestsFailedErase", 1),
+        Case({{187, {~0ULL}}}, "numMemExtreme", -1), Case({{144, {5}}}, "numMemExtreme", none),
+        Case({{188, {1ULL << 32}}}, "maxMemExtremeDuration", 0),
+        Case({{142, {12345}}}, "maxMemChokeDuration", 12300),
+        Case({{145, {12345}}}, "maxMemExtremeDuration", none),
+        Case({{143, {12345}}}, "memChokeDuration", 12345),
+        Case({{121, {1, 2, 3, 4}}}, "PadSize1", 1),
+        Case({{114, {1, 2, 3, 4, 5}}}, "BandsPerInternalFlow3", 5),
+        Case({{77, {1}}, {77, {2}}}, "StaticDataSizeInMB", 2)}) {
     auto records = own;
     records.push_back({53, {0x20002}});
     const auto found = infoOf(records).number(std::string(kNANDInfoKeyPrefix) + suffix);
@@ -93,14 +88,13 @@ TEST(NandInfoTest, ReadsStatistics) {
 }
 
 TEST(NandInfoTest, RoundsMaximumDurations) {
-  const std::uint64_t values[] = {
-      0, 99, 100, 999, 1000, 1004, 1005, 12345, 12350, 99949, 99950, 4294967295, (5ULL << 32) + 12};
-  const std::vector<std::int64_t> expected{0,     99,    101,   1000,   1000,       1000, 1010,
-                                           12300, 12400, 99900, 100000, 4290000000, 12};
-  std::vector<std::int64_t> rounded;
-  for (const std::uint64_t value : values)
-    rounded.push_back(roundMaximumDuration(value));
-  EXPECT_EQ(rounded, expected);
+  using Case = std::pair<std::uint64_t, std::int64_t>;
+  for (const auto& [value, rounded] :
+       {Case(0, 0), Case(99, 99), Case(100, 101), Case(999, 1000), Case(1000, 1000),
+        Case(1004, 1000), Case(1005, 1010), Case(12345, 12300), Case(12350, 12400),
+        Case(99949, 99900), Case(99950, 100000), Case(4294967295, 4290000000),
+        Case((5ULL << 32) + 12, 12)})
+    EXPECT_EQ(roundMaximumDuration(value), rounded) << value;
 }
 
 TEST(NandInfoTest, MapsAllKeys) {
@@ -114,7 +108,7 @@ TEST(NandInfoTest, MapsAllKeys) {
       EXPECT_EQ(findKeyMapRow(name), first == keyMap.end() ? nullptr : &*first) << name;
     }
   }
-  EXPECT_EQ(fakes::fingerprint(rows), 0xB6F60D219004B5EBU);
+  EXPECT_EQ(fingerprint(rows), 0xB6F60D219004B5EBU);
   EXPECT_EQ(findKeyMapRow(""), nullptr);
 
   // All statistics at once: all rows but the two of fragments, which no statistic has.
@@ -124,38 +118,30 @@ TEST(NandInfoTest, MapsAllKeys) {
   EXPECT_EQ(infoOf(records).size(), 24U + 302 + 5);
 }
 
-TEST(NandInfoTest, TellsErrors) {
-  const auto error = [](const char* message) {
-    return Dictionary{{"com.norvane.NANDInfo.Error", "1"},
-                      {"com.norvane.NANDInfo.ErrorMessage", message}};
-  };
+TEST(NandInfoTest, AddsToADictionaryUnlessItFails) {
   const Dictionary before{{"com.norvane.NANDInfo.NodesFree", "x"}, {"other", 1}};
-  const std::pair<std::vector<Record>, Dictionary> kCases[] = {
-      {{{4, {1}}}, error("Unsupported export version")},
-      {{{53, {0x20003}}, {0x30000001, {}}}, error("Unable to parse buffer")}};
-  for (const auto& [records, info] : kCases) {
-    StoragePlatform platform({driver(answering(statistics(records)))});
-    EXPECT_EQ(plist::Value(CopyNANDInfo(platform.platform)), info);
-    auto target = plist::mutableCopy(before);
-    DumpNANDInfo(platform.platform, target);
-    EXPECT_EQ(plist::Value(target), before);
+  auto target = plist::mutableCopy(before);
+  using Case = std::pair<std::vector<Record>, const char*>;
+  for (const auto& [records, message] :
+       {Case({{4, {1}}}, "Unsupported export version"),
+        Case({{53, {0x20003}}, {0x30000001, {}}}, "Unable to parse buffer")}) {
+    StoragePlatform failing({driver(answering(statistics(records)))});
+    EXPECT_EQ(CopyNANDInfo(failing.platform),
+              (Dictionary{{"com.norvane.NANDInfo.Error", "1"},
+                          {"com.norvane.NANDInfo.ErrorMessage", message}}));
+    DumpNANDInfo(failing.platform, target);
+    EXPECT_EQ(target, before);
   }
-}
-
-TEST(NandInfoTest, AddsToADictionary) {
   StoragePlatform platform({driver(answering(statistics({{53, {0x20001}}, {12, {6}}})))});
-  Dictionary target{{"com.norvane.NANDInfo.NodesFree", "x"}, {"other", 1}};
   DumpNANDInfo(platform.platform, target);
   EXPECT_EQ(target.size(), 12U + 1);
-  EXPECT_EQ(target.number(kNANDInfoNumNodesFreeKey), plist::Number(6));
+  EXPECT_EQ(target.get(kNANDInfoNumNodesFreeKey), Value(6));
   EXPECT_FALSE(target.contains(kNANDInfoDriverVersionKey));
 
-  const auto demoMode = [&](const plist::Value& preference) {
+  for (const bool preference : {true, false}) {
     platform.preferences.domain("com.norvane.demo-settings").set("StoreDemoMode", preference);
-    return CopyNANDInfo(platform.platform).number(kNANDInfoDemoModeKey)->int64();
-  };
-  EXPECT_EQ(demoMode(true), 1);
-  EXPECT_EQ(demoMode(false), 0);
+    EXPECT_EQ(CopyNANDInfo(platform.platform).get(kNANDInfoDemoModeKey), Value(preference ? 1 : 0));
+  }
 }
 
 }  // namespace

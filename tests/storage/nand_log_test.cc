@@ -9,40 +9,41 @@
 namespace tavrel {
 namespace {
 
+using namespace fakes;
+using plist::Array;
+using plist::Data;
+using plist::Dictionary;
+using plist::Value;
+
 class NandLog : public testing::Test {
  protected:
   NandLog() { fake.clock.instant = start; }
 
   // How many logs there are then.
-  std::size_t write(const plist::Dictionary& statistics) {
+  std::size_t write(const Dictionary& statistics) {
     NLW_WriteLog(fake.platform, "165", statistics);
     return fake.submission.logs.size();
   }
 
   const plist::Date start = plist::Date::since1970(1794852138);
-  const plist::Dictionary none = plist::Dictionary::create();
-  fakes::FakePlatform fake;
-  plist::Dictionary preferences = fake.preferences.domain("com.norvane.zentrix.tavrel");
+  const Dictionary none = Dictionary::create();
+  FakePlatform fake;
+  Dictionary preferences = fake.preferences.domain("com.norvane.zentrix.tavrel");
 };
 
 TEST_F(NandLog, WritesEveryFigureUnderAHeader) {
   fake.answers.answers.set("InverseDeviceID", "faultline");
-  ASSERT_EQ(write({{"UserWamp", 2.5},
-                   {"single", 0.125F},
-                   {"hostWrites", 42},
-                   {"most", ~std::uint64_t{0}},
-                   {"yes", true},
-                   {"name", "text"},
-                   {"when", start},
-                   {"bytes", plist::Data(ByteSpan{})},
-                   {"inner", plist::Dictionary{{"a", 1}}},
-                   {"ValidityList[0]", plist::Array{12, 40, 7}},
-                   {"mixed", plist::Array{"a", 0.5, false, plist::Array{1}}},
-                   {"flags", plist::Array{true}},
-                   {"texts", plist::Array{"1", plist::Array{1}}},
-                   {"empty", plist::Array::create()},
-                   {"bad \xff utf-8", -0.001}}),
-            1U);
+  using Case = std::pair<const char*, Value>;
+  auto figures = Dictionary::create();
+  for (const auto& [key, value] :
+       {Case("UserWamp", 2.5), Case("single", 0.125F), Case("hostWrites", 42), Case("most", ~0UL),
+        Case("yes", true), Case("name", "text"), Case("when", start),
+        Case("bytes", Data(ByteSpan{})), Case("inner", Dictionary{{"a", 1}}),
+        Case("ValidityList[0]", Array{12, 40, 7}), Case("mixed", Array{"a", 0.5, false, Array{1}}),
+        Case("flags", Array{true}), Case("texts", Array{"1", Array{1}}),
+        Case("empty", Array::create()), Case("bad \xff utf-8", -0.001)})
+    figures.set(key, value);
+  ASSERT_EQ(write(figures), 1U);
   const auto& log = fake.submission.logs[0];
   EXPECT_EQ(log.type + log.name, "165StorageStatus");
   EXPECT_FALSE(log.options);
@@ -52,9 +53,8 @@ TEST_F(NandLog, WritesEveryFigureUnderAHeader) {
             "\n2026-11-16 18:02:18 +0000 tavrel[211]: UserWamp:2.50;single:0.12;hostWrites:42;"
             "most:18446744073709551615;yes:1;ValidityList[0]:12,40,7;mixed:a,0.5,0,[1];flags:1;"
             "bad \xEF\xBF\xBD utf-8:-0.00\n");
-  EXPECT_EQ(fake.journal,
-            (fakes::Journal{"write log", "set com.norvane.zentrix.tavrel SSLastLoggedAt",
-                            "synchronize com.norvane.zentrix.tavrel"}));
+  EXPECT_EQ(fake.journal, (Journal{"write log", "set com.norvane.zentrix.tavrel SSLastLoggedAt",
+                                   "synchronize com.norvane.zentrix.tavrel"}));
 }
 
 TEST_F(NandLog, WaitsAWeekWhateverTheSubmissionSaid) {
@@ -83,7 +83,7 @@ TEST_F(NandLog, WaitsAWeekWhateverTheSubmissionSaid) {
 TEST_F(NandLog, CatchesTheExceptionsOfThePlatformOnly) {
   fake.dateFormatting.raises = std::make_exception_ptr(PlatformException("RangeException"));
   write(none);
-  EXPECT_EQ(fake.log.messages(), fakes::Journal{"An exception occurred: RangeException"});
+  EXPECT_EQ(fake.log.messages(), Journal{"An exception occurred: RangeException"});
   fake.dateFormatting.raises = std::make_exception_ptr(std::runtime_error("of another kind"));
   EXPECT_THROW(write(none), std::runtime_error);
   EXPECT_TRUE(fake.journal.empty());

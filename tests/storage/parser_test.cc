@@ -7,9 +7,7 @@
 namespace tavrel {
 namespace {
 
-using fakes::Bytes;
-using fakes::Record;
-using fakes::statistics;
+using namespace fakes;
 
 /// "name=text", once the text was found to be the value's.
 std::vector<std::string> listed(const ASPContext& context) {
@@ -25,8 +23,7 @@ std::vector<std::string> listed(const ASPContext& context) {
 
 TEST(ParserTest, ParsesRecords) {
   const std::vector<Record> twice{{53, {6}}, {53, {7}}};
-  // `cut` bytes are taken off the end, and 7 of no whole unit follow what is left; `exportVersion`
-  // is 5 before the parse.
+  // `cut` bytes are taken off the end; `exportVersion` is 5 before the parse.
   using Case =
       std::tuple<std::vector<Record>, std::size_t, int, std::uint32_t, std::vector<std::string>>;
   for (const auto& [records, cut, result, exportVersion, entries] :
@@ -59,7 +56,7 @@ TEST(ParserTest, ParsesRecords) {
   for (const std::uint64_t count : {0x1FFFFFFFULL, 0x20000000ULL, 0xFFFFFFFFULL}) {
     Bytes bytes;
     for (const std::uint64_t unit : {4 | count << 32, std::uint64_t{7}})
-      fakes::append64(bytes, unit);
+      append64(bytes, unit);
     ASPContext context;
     EXPECT_EQ(ASPParseBufferToCxt(context, bytes), 0);
   }
@@ -81,7 +78,7 @@ TEST(ParserTest, KnowsAllStatistics) {
                                       : format("%s%u=%llu", row.name, i, value));
     }
   }
-  EXPECT_EQ(fakes::fingerprint(rows), 0x763591C316AD340AU);
+  EXPECT_EQ(fingerprint(rows), 0x763591C316AD340AU);
   EXPECT_EQ(records.size(), 349U);
   EXPECT_EQ(expected.size(), 1267U);
   const Bytes bytes = statistics(records);

@@ -10,6 +10,10 @@
 
 namespace tavrel::fakes {
 
+using plist::Array;
+using plist::Data;
+using plist::Dictionary;
+using plist::Value;
 using Bytes = std::vector<std::byte>;
 
 struct Record {
@@ -46,32 +50,25 @@ inline std::uint64_t fingerprint(std::string_view text) {
   return hash;
 }
 
-/// A request of 24 bytes as the driver must see it.
-inline plist::Data request(std::uint8_t selector, std::uint8_t flags) {
+inline Data request(std::uint8_t selector, std::uint8_t flags) {
   Bytes bytes(24);
   bytes[0] = std::byte{selector};
   bytes[4] = std::byte{flags};
-  return plist::Data(bytes);
+  return Data(bytes);
 }
 
-/// The methods that answer a query for statistics with `buffer`.
-inline plist::Array answering(const Bytes& buffer, int method = 8) {
-  return {plist::Dictionary{
-              {"Method", method},
-              {"Request", request(13, 1)},
-              {"Output", plist::Data(little32(static_cast<std::uint32_t>(buffer.size())))}},
-          plist::Dictionary{
-              {"Method", method}, {"Request", request(13, 0)}, {"Output", plist::Data(buffer)}}};
+inline Array answering(const Bytes& buffer, int method = 8) {
+  const Data size(little32(static_cast<std::uint32_t>(buffer.size())));
+  return {Dictionary{{"Method", method}, {"Request", request(13, 1)}, {"Output", size}},
+          Dictionary{{"Method", method}, {"Request", request(13, 0)}, {"Output", Data(buffer)}}};
 }
 
-inline plist::Dictionary driver(const plist::Array& methods, const char* className = "ASPStorage") {
+inline Dictionary driver(const Array& methods, const char* className = "ASPStorage") {
   return {{"Class", className}, {"Methods", methods}};
 }
 
-/// A platform with recorded drivers.
 struct StoragePlatform : FakePlatform {
-  explicit StoragePlatform(const plist::Array& recorded)
-      : registry(plist::Dictionary{{"Services", recorded}}, log) {
+  explicit StoragePlatform(const Array& rows) : registry(Dictionary{{"Services", rows}}, log) {
     drivers.behind = &registry;
   }
   RecordedRegistry registry;

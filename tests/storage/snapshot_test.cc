@@ -130,8 +130,7 @@ TEST(Snapshot, PrintsFieldsByKindAndLeavesUnusedRecordsOut) {
 }
 
 TEST(Snapshot, RefusesDescriptorsThatBreakALimit) {
-  const auto of = [](std::uint32_t kind, std::uint32_t offset, std::uint32_t size,
-                     const char* format) {
+  const auto of = [](std::uint32_t kind, std::uint32_t offset, std::uint32_t size, auto* format) {
     return descriptor(6, 12, 2, {{9, 0, 0, ""}, {kind, offset, size, format}});
   };
   const auto asks = [](std::string_view text, int kind) {

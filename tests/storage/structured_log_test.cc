@@ -8,33 +8,21 @@
 namespace tavrel {
 namespace {
 
-using fakes::Bytes;
-using fakes::little32;
-using fakes::request;
-using fakes::StoragePlatform;
-using plist::Array;
-using plist::Data;
-using plist::Dictionary;
-using plist::Value;
+using namespace fakes;
 
 Bytes words(const std::vector<std::uint32_t>& values) {
-  Bytes out;
-  for (const std::uint32_t value : values) {
-    const Bytes word = little32(value);
-    out.insert(out.end(), word.begin(), word.end());
-  }
+  Bytes out(values.size() * 4);
+  for (std::size_t i = 0; i < values.size(); ++i)
+    storeLittle32(out, i * 4, values[i]);
   return out;
 }
 
-/// Answers of a driver, one list at a time.
 struct Driver {
   Array methods = Array::create();
 
-  void answer(std::uint8_t selector, const Bytes& list, std::uint8_t subList = 0) {
-    const auto flags = static_cast<std::uint8_t>(subList << 2);
-    const auto size = static_cast<std::uint32_t>(list.size());
-    query(selector, flags, {{"Output", Data(little32(size))}});
-    row(selector, flags, {{"Output", Data(list)}});
+  void answer(std::uint8_t selector, const Bytes& list) {
+    query(selector, 0, {{"Output", Data(little32(static_cast<std::uint32_t>(list.size())))}});
+    row(selector, 0, {{"Output", Data(list)}});
   }
   void query(std::uint8_t selector, std::uint8_t flags, const Dictionary& answer) {
     row(selector, flags | 1, answer);
@@ -45,22 +33,19 @@ struct Driver {
     method.set("Request", request(selector, flags));
     methods.append(method);
   }
-  Dictionary service(const Value& characteristics) const {
-    Dictionary service = fakes::driver(methods);
+  /// The driver's service, and the one above it that has the device's characteristics.
+  Array services(const Value& characteristics) const {
+    Dictionary service = driver(methods);
     if (characteristics) service.set("Parents", Dictionary{{"IOService", 7}});
-    return service;
-  }
-  static Dictionary parent(const Value& characteristics) {
-    return {{"Class", "Bus"},
-            {"EntryID", 7},
-            {"Properties", Dictionary{{"Device Characteristics", characteristics}}}};
+    const Dictionary properties{{"Device Characteristics", characteristics}};
+    return {service, Dictionary{{"Class", "Bus"}, {"EntryID", 7}, {"Properties", properties}}};
   }
 };
 
 constexpr std::uint8_t kStatistics = 13, kBands = 11, kDefects = 15, kTelemetry = 17;
 
 // 2.5 block writes per host write, 0.75 within the intermediate bands.
-const fakes::Bytes kStatisticsBuffer = fakes::statistics(
+const Bytes kStatisticsBuffer = statistics(
     {{49, {4096}}, {50, {1}}, {20, {5}}, {4, {2}}, {129, {3}}, {84, {9}}, {129, {1}}, {84, {1}}});
 
 TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
@@ -76,7 +61,7 @@ TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
     Driver driver;
     driver.answer(kStatistics, kStatisticsBuffer);
     driver.answer(kBands, list);
-    StoragePlatform platform({driver.service(1), Driver::parent(1)});
+    StoragePlatform platform(driver.services(1));
     platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", preference);
     gForceCollectionSet = forced;
     DumpStorageStructuredLog(platform.platform, false);
@@ -87,8 +72,7 @@ TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
     ASSERT_EQ(platform.submission.logs.size(), logged ? 1U : 0U);
     if (!logged) continue;
     EXPECT_EQ(platform.submission.logs[0].type, "165");
-    EXPECT_TRUE(platform.submission.logs[0].content.ends_with(kText))
-        << platform.submission.logs[0].content;
+    EXPECT_TRUE(platform.submission.logs[0].content.ends_with(kText));
   }
   // One byte less than the records need, counts that would wrap, no records, no header.
   StoragePlatform platform(Array::create());
@@ -104,45 +88,35 @@ TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
 
 TEST(StructuredLogTest, HasInfiniteAmplificationWithoutHostWrites) {
   Driver driver;
-  driver.answer(kStatistics, fakes::statistics({{49, {4096}}, {50, {1}}, {20, {5}}}));
-  StoragePlatform platform({driver.service(1), Driver::parent(1)});
+  driver.answer(kStatistics, statistics({{49, {4096}}, {50, {1}}, {20, {5}}}));
+  StoragePlatform platform(driver.services(1));
   platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 9.5);
   DumpStorageStructuredLog(platform.platform, false);
   EXPECT_TRUE(gNeedValidityList);
-  // Without statistics both are unknown.
   StoragePlatform without(Array{});
   EXPECT_FALSE(DumpStorageStructuredLog(without.platform, false));
+  const std::string none = "Could not get matching Kernkit service for exporting classes\n";
+  EXPECT_EQ(without.streams.error, none + none);
   EXPECT_FALSE(gNeedValidityList);
   EXPECT_EQ(gCurrentUserWamp, 0);
 }
 
 TEST(StructuredLogTest, SaysWhatFails) {
-  constexpr const char* kNoService =
-      "Could not get matching Kernkit service for exporting classes\n";
   const std::string kStatisticsFailed = "IOConnectCallStructMethod: -536870206";
   const auto failedQueries = [](std::initializer_list<int> indexes) {
     std::string text;
-    for (const int index : indexes) {
-      appendFormat(text,
-                   "IOConnectCallStructMethod failed with status 0xe00002c2 on selector "
-                   "index %d\n",
-                   index);
-    }
+    for (const int index : indexes)
+      text += "IOConnectCallStructMethod failed with status 0xe00002c2 on selector index " +
+              std::to_string(index) + "\n";
     return text;
   };
   const Dictionary characteristics{
       {"chip-id", "K3V"}, {"manufacturer-id", "AD825223215F"}, {"num-bus", 0}};
-  const auto run = [&](const Driver& driver, const Value& under, bool result,
-                       const std::string& error) {
-    StoragePlatform platform({driver.service(under), Driver::parent(under)});
+  const auto run = [&](const Driver& driver, const Value& under, bool result, const auto& error) {
+    StoragePlatform platform(driver.services(under));
     EXPECT_EQ(DumpStorageStructuredLog(platform.platform, false), result) << error;
     EXPECT_EQ(platform.streams.error, error);
   };
-  {
-    StoragePlatform platform(Array{});
-    EXPECT_FALSE(DumpStorageStructuredLog(platform.platform, false));
-    EXPECT_EQ(platform.streams.error, std::string(kNoService) + kNoService);
-  }
   run({}, {}, false, kStatisticsFailed + "failed to create dictionary");
   // Queries that fail do not count; nor do fetches.
   run({}, characteristics, true, kStatisticsFailed + failedQueries({0, 1, 2, 3, 4}));
@@ -156,7 +130,7 @@ TEST(StructuredLogTest, SaysWhatFails) {
           "Could not retrieve data from driver for selector 17\n" + failedQueries({3}));
   // What a driver's row has no getter for is not asked.
   {
-    StoragePlatform platform({driver.service(characteristics), Driver::parent(characteristics)});
+    StoragePlatform platform(driver.services(characteristics));
     EXPECT_TRUE(logStorageLists(platform.platform, *platform.drivers.firstService("ASPStorage"),
                                 {.characteristicsProperty = "Device Characteristics"}, false));
     EXPECT_EQ(platform.streams.error,
@@ -169,7 +143,7 @@ TEST(StructuredLogTest, SaysWhatFails) {
   flagged.answer(kStatistics, kStatisticsBuffer);
   flagged.query(kDefects, 2, {{"Output", Data(little32(12))}});
   flagged.row(kDefects, 2, {{"Output", Data(words({0, 9, 0}))}});
-  StoragePlatform platform({flagged.service(1), Driver::parent(1)});
+  StoragePlatform platform(flagged.services(1));
   EXPECT_TRUE(DumpStorageStructuredLog(platform.platform, true));
   ASSERT_EQ(platform.crashReporting.records.size(), 1U);
   EXPECT_EQ(platform.crashReporting.records[0].second, (Dictionary{{"Factory Count", 9}}));
@@ -255,14 +229,9 @@ TEST(StructuredLogTest, FilesDefectsThatLieInTheBuffer) {
   ASSERT_EQ(records.size(), 3U);
   EXPECT_EQ(records[2].second, (Dictionary{{"Factory Count", 4}}));
   EXPECT_EQ(records[0].second, (Dictionary{{"Factory Count", 3}}));
-  EXPECT_EQ(records[1].second, (Dictionary{{"Bus", 1},
-                                           {"CE", 65535},
-                                           {"CAU", 2},
-                                           {"Block", -1},
-                                           {"Cycle", 4},
-                                           {"Reason", 5},
-                                           {"Page", 6},
-                                           {"Temperature", -5}}));
+  EXPECT_EQ(textOf(records[1].second),
+            R"({"Bus": 1, "CE": 65535, "CAU": 2, "Block": -1, "Cycle": 4, "Reason": 5, )"
+            R"("Page": 6, "Temperature": -5})");
 }
 
 }  // namespace
