@@ -54,7 +54,7 @@ TEST(DailyStatisticsTest, SetsTheNumbersOfTheNandInformation) {
 TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
   const auto event = [](std::uint8_t id, std::uint8_t registers) {
     Bytes bytes;
-    append64(bytes, id | registers << 8U);
+    append64(bytes, std::uint64_t{id} | std::uint64_t{registers} << 8U);
     for (std::uint64_t i = 0; i < 8; ++i)
       append64(bytes, i == 0 ? ~0UL : i);
     return bytes;
