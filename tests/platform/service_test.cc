@@ -145,7 +145,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
       {good, {sealed.get()}, "a packet that passes a memory file must be empty"},
       {"", {sealed.get(), sealed.get(), sealed.get()}, "not exactly one descriptor"},
       {"", {unsealed.get()}, "not sealed against shrinking, growing and writing"},
-      {"", {ordinary.get()}, "no memory file that can be sealed"},
+      {"", {ordinary.get()}, "not a memory file that can be sealed"},
       {"", {huge.get()}, "the memory file has 16777217 bytes, the limit is 16777216"}};
   std::size_t before = 0;
   for (const auto& [packet, files, reason] : cases) {

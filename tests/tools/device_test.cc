@@ -182,7 +182,7 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
     device.check(unreadable,
                  fails("cannot read preferences " + device.path(domain) +
                        ": not a property list: it begins neither with \"bplist00\" nor with \"<\"; "
-                       "mend it, or the next write sets it aside"));
+                       "repair it, or the next write sets it aside"));
   }
 }
 

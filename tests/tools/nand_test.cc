@@ -221,7 +221,7 @@ entries[0]: 4294967296 names no statistic: give its name, or its number of at mo
 entries[2]: ECBins1 does not follow ECBins0: give the elements from 0 on, one after the other, or a list
 entries[0]: "sum" is not a member of a record: it has key, count and values
 entries[0]: "count": 4294967296 is not an integer from 0 to 2^32 - 1
-entries[0]: "values": 2 is no list
+entries[0]: "values": 2 is not a list
 entries[0]: "hex": "012": give pairs of hexadecimal digits
 entries[0]: 7 is not an entry: give [statistic, value], {"key": …, "values": […]} or {"hex": …}
 )");
