@@ -12,7 +12,7 @@ constexpr const char* kController = "/sys/devices/system/edac/mc/mc0/";
 
 struct EccDevice : DeviceServices {
   EccDevice() {
-    count("ce_count", 0);  // in the place of the machine's own
+    count("ce_count", 0);  // instead of the machine's own
     write("/sys/devices/system/edac/mc/mc0x/ce_count", "9\n");
   }
   void count(const char* file, std::uint64_t errors) const {
@@ -133,7 +133,7 @@ TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
   device.count("ue_count", 1);
   auto second = device.events();
   EXPECT_EQ(all(second), "");
-  device.count("ce_count", 3);  // the machine was started anew
+  device.count("ce_count", 3);  // the machine has started again
   EXPECT_EQ(all(second), "1: 0 3 3; ");
   EXPECT_TRUE(device.log.lines.empty());
 }

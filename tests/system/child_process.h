@@ -47,7 +47,7 @@ inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& b
   });
   int status = 0;
   ::waitpid(child, &status, 0);
-  // Every call stops the process twice: before it and behind it.
+  // Every call stops the process twice: before it and after it.
   for (std::size_t stop = 0; stop < 2 * calls + 1; ++stop) {
     ::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr);
     ::waitpid(child, &status, 0);
