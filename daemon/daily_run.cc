@@ -81,13 +81,13 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
   bool isKept = false;
   runGuarded(platform.log, "checkpoint the store after the tasks",
              [&] { isKept = platform.statistics->BHClientCheckpoint(); });
-  if (!isKept) {
+  if (isKept) {
+    rememberLogOutcome(platform.preferences, outcome);
+    platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
+  } else {
     platform.log->log(LogLevel::Error,
                       "the statistics of the run are not kept: day %d stays undone", yesterday);
-    return outcome;
   }
-  rememberLogOutcome(platform.preferences, outcome);
-  platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);
   return outcome;
 }

@@ -71,6 +71,7 @@ TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
   fake.store.keepsValues = false;
   runDailyIfNeeded(fake.platform, {});
   EXPECT_FALSE(storedDay());
+  EXPECT_EQ(fake.journal.back(), "synchronize com.norvane.tallied.tavrel");
   EXPECT_EQ(fake.log.messages().back(),
             "the statistics of the run are not kept: day 19999 stays undone");
 }
