@@ -89,7 +89,9 @@ TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
   EXPECT_TRUE(reader.wholeness());
   EXPECT_EQ(read("a\n" + large + "b\nc", true), std::vector<std::string>());
   EXPECT_FALSE(reader.wholeness());
-  EXPECT_EQ(read("new\n", false), (std::vector<std::string>{"1new"}));
+  EXPECT_EQ(read("new\ntorn", false), (std::vector<std::string>{"1new"}));
+  EXPECT_EQ(read("new\n", false), std::vector<std::string>());  // the writer has cut the end off
+  EXPECT_EQ(read("new\nlonger\n", false), (std::vector<std::string>{"2longer"}));
 }
 
 // Calls a hook whenever what was printed is flushed.

@@ -29,26 +29,26 @@ Status RecordReader::read(bool isComplete, const LineHandler& handler) {
   if (status.st_size < offset_) {
     offset_ = 0;
     lines_ = tornLines_ = 0;
-    rest_.clear();
   }
+  std::string rest;  // the beginning of a line
   for (;;) {
-    const std::size_t kept = rest_.size();
+    const std::size_t kept = rest.size();
     if (kept > limits::kStructuredRecordFileBytes) {
       return Error{
           format("cannot read %s: line %llu is too long; move the file away", path_, lines_ + 1)};
     }
-    rest_.resize(kept + kBlockBytes);
-    const ssize_t got = pread(file.get(), rest_.data() + kept, kBlockBytes, offset_);
-    rest_.resize(kept + static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
+    rest.resize(kept + kBlockBytes);
+    const auto unread = offset_ + static_cast<std::int64_t>(kept);
+    const ssize_t got = pread(file.get(), rest.data() + kept, kBlockBytes, unread);
+    rest.resize(kept + static_cast<std::size_t>(std::max<ssize_t>(got, 0)));
     if (got < 0 && errno == EINTR) continue;
     if (got < 0) return systemError("read", path_);
     if (got == 0) break;
-    offset_ += got;
 
     std::size_t begin = 0;
     std::size_t searched = kept;  // the kept text has no line end
-    for (std::size_t end; (end = rest_.find('\n', searched)) != std::string::npos;) {
-      const std::string_view line = std::string_view(rest_).substr(begin, end - begin);
+    for (std::size_t end; (end = rest.find('\n', searched)) != std::string::npos;) {
+      const std::string_view line = std::string_view(rest).substr(begin, end - begin);
       if (!line.empty() && line.find_first_not_of('\0') == std::string_view::npos) {
         leaveOutTornLine();
       } else {
@@ -56,9 +56,13 @@ Status RecordReader::read(bool isComplete, const LineHandler& handler) {
       }
       begin = searched = end + 1;
     }
-    rest_.erase(0, begin);
+    offset_ += static_cast<std::int64_t>(begin);
+    rest.erase(0, begin);
   }
-  if (isComplete && !std::exchange(rest_, {}).empty()) leaveOutTornLine();
+  if (isComplete && !rest.empty()) {
+    offset_ += static_cast<std::int64_t>(rest.size());
+    leaveOutTornLine();
+  }
   return Done{};
 }
 

@@ -11,7 +11,8 @@
 
 namespace tavrel {
 
-/// Yields whole lines, each once. A file that has become shorter is read from its beginning.
+/// Yields whole lines, each once. The beginning of a line is read again with its end, because a
+/// writer may cut it off first. A file that has lost whole lines is read from its beginning.
 class RecordReader {
  public:
   using LineHandler = std::function<void(std::string_view line, std::uint64_t number)>;
@@ -31,11 +32,10 @@ class RecordReader {
   void leaveOutTornLine();
 
   std::string path_;
-  std::int64_t offset_ = 0;  // of what comes after `rest_`
+  std::int64_t offset_ = 0;  // of the first line that was not handed out
   std::uint64_t lines_ = 0;
   std::uint64_t tornLines_ = 0;
   std::uint64_t firstTornLine_ = 0;
-  std::string rest_;  // the beginning of a line
 };
 
 struct StructuredRecord {
