@@ -81,6 +81,7 @@ Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name
   const LogEnvelope file{"file", name, {}};
   if (name == "-" || name.empty() || name.find('/') != std::string::npos) return file;
   const auto logs = filedLogs(context);
+  if (!logs && !FileSystem::status(name)) return logs.error();
   if (!logs) return file;
   const FiledLog* found = nullptr;
   std::set<std::string_view> names;

@@ -94,6 +94,7 @@ std::optional<NandLog> parseNandLog(std::string_view text) {
 
 /// When the next log may be written.
 struct NextLog {
+  bool isKnown = true;  // not when preferences cannot be read
   std::optional<plist::Date> last;
   std::optional<plist::Date> from;  // nothing means at the next run
   bool isLastInFuture = false;
@@ -104,6 +105,7 @@ NextLog nextLog(ToolContext& context) {
   next.last = context.preferences()
                   .ZTXPreferencesGetValue(kNandLogLastLoggedKey, kDefaultPreferenceDomain)
                   .date();
+  next.isKnown = !context.hasComplaints();
   if (!next.last) return next;
   const double last = next.last->secondsSince1970();
   const double age = context.platform().clock->now().secondsSince1970() - last;
@@ -113,6 +115,7 @@ NextLog nextLog(ToolContext& context) {
 }
 
 std::string textOf(const NextLog& next) {
+  if (!next.isKnown) return "unknown";
   if (!next.last) return "the next run may write one; none was written so far";
   if (!next.from) {
     return format("the next run may write one; the last was written %s", dateText(*next.last));
@@ -128,6 +131,7 @@ std::string textOf(const NextLog& next) {
 }
 
 Json jsonOf(const NextLog& next) {
+  if (!next.isKnown) return nullptr;
   return {{"last_logged", next.last ? Json(isoDateText(*next.last)) : Json(nullptr)},
           {"last_is_in_future", next.isLastInFuture},
           {"allowed_now", !next.from},
