@@ -45,7 +45,8 @@ void handleAppInfoMessage(Platform& platform, const plist::Value& event) {
   const auto day = integerIn(message, "value");
   if (*operation == kForceDay && !day) return;
   if (platform.state->clientRequestHandled) {
-    platform.log->log(LogLevel::Debug, "ignored operation %d: this process has had its one request",
+    platform.log->log(LogLevel::Debug,
+                      "ignored operation %d: this process has already acted on a request",
                       *operation);
     return;
   }

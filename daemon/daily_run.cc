@@ -45,7 +45,7 @@ constexpr DailyTask kDailyTasks[] = {
      [](DailyWork& work) { dailyStorageStatistics(work.platform, work.onStep); }},
     {"Clean-up of structured records", "clean up structured records",
      [](DailyWork& work) { work.platform.crashReporting->FLDumpAllOldStructuredDataLogs(); }},
-    {"Changes of the system, and tasking", "finish tracking OS updates and tasking",
+    {"OS changes and tasking", "finish tracking OS updates and tasking",
      [](DailyWork& work) { trackOSChangeAndTasking(work.platform); }},
     {"Roll-over of the support log", "roll the support log",
      [](DailyWork& work) { work.platform.crashReporting->rollNorvaneCareLogs(); }},
@@ -57,8 +57,12 @@ constexpr std::int64_t kLongestGapDays = 3660;
 void noteDaysPassedOver(SystemLog& log, std::int64_t lastRunDay, std::int32_t yesterday) {
   const std::int64_t sinceRun = wrappingSubtract(yesterday, lastRunDay);
   if (sinceRun <= 1 || sinceRun > kLongestGapDays) return;
-  log.log(LogLevel::Info, "days without a run that will not be reported: %lld (%lld to %d)",
-          sinceRun - 1, lastRunDay + 1, previousDay(yesterday));
+  if (sinceRun == 2) {
+    log.log(LogLevel::Info, "1 day had no run and will not be reported: %lld", lastRunDay + 1);
+  } else {
+    log.log(LogLevel::Info, "%lld days had no run and will not be reported: %lld to %d",
+            sinceRun - 1, lastRunDay + 1, previousDay(yesterday));
+  }
 }
 
 }  // namespace
@@ -86,7 +90,8 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
     platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   } else {
     platform.log->log(LogLevel::Error,
-                      "the statistics of the run are not kept: day %d stays undone", yesterday);
+                      "the run's statistics could not be saved: the next run repeats day %d",
+                      yesterday);
   }
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);
   return outcome;

@@ -14,20 +14,20 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kHelp =
-    "Usage: tavrel [-d | -f | -t]\n"
+    "Usage: tavrel [-d | -f | -t | -h | --version]\n"
     "\n"
     "Reports a device's usage statistics once a day.\n"
     "\n"
     "  (none)      Serve clients until 10 seconds have passed without an event\n"
     "  -d          Do the daily tasks for yesterday, unless they have been done\n"
-    "  -f          Do the daily tasks for yesterday, done or not\n"
+    "  -f          Do the daily tasks for yesterday, even if they have been done\n"
     "  -t          Do the daily tasks for today\n"
     "  -h, --help  Print this help\n"
     "  --version   Print the version\n"
     "\n"
     "TAVREL_ROOT in the environment names the folder that holds the device's files\n"
-    "(default: /). The exit status is always 0. See tavrel(8), and tavrelctl(1) for\n"
-    "a look at the device.\n";
+    "(default: /). The exit status is always 0. See tavrel(8). tavrelctl(1) shows\n"
+    "what a run would do and has done.\n";
 
 // True when the wait ended because nothing happened, false when the system ended it.
 bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {

@@ -90,7 +90,7 @@ struct TaskingPlan {
     const auto xml = propertyLists.encodeXml(kept);
     if (!xml) return xml.error().message;
     if (xml->size() <= Preferences::kLargestChange) return {};
-    return format("it needs %zu bytes and may have %zu", xml->size(), Preferences::kLargestChange);
+    return format("it needs %zu bytes; the limit is %zu", xml->size(), Preferences::kLargestChange);
   }
 };
 
@@ -117,9 +117,10 @@ class Tracker {
     if (!plan.isScheduled()) return false;
     if (plan.change == TaskingChange::None) return true;
     if (plan.change == TaskingChange::Refuse) {
-      platform_.log->log(LogLevel::Error,
-                         "cannot apply %s of domain %s: %s; schedule one that preferences can hold",
-                         kScheduledTaskingKey, kScheduleDomain, plan.refusal);
+      platform_.log->log(
+          LogLevel::Error,
+          "cannot apply %s of domain %s: %s; schedule one that preferences can store",
+          kScheduledTaskingKey, kScheduleDomain, plan.refusal);
       return true;
     }
     PreferenceWriter writer(platform_.preferences);

@@ -20,7 +20,7 @@ constexpr OutcomeTexts kTexts[] = {
     {"not-permitted", "diagnostic submission not allowed"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},
-    {"not-filed", "filing failed, the system log says why"},
+    {"not-filed", "filing failed; see the system log"},
 };
 static_assert(std::size(kTexts) == static_cast<std::size_t>(LogOutcome::NotFiled) + 1);
 

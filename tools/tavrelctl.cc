@@ -45,7 +45,7 @@ std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
 void addGlobalOptions(CLI::App& app, ToolContext& context) {
   app.fallthrough();
   app.require_subcommand(1);
-  app.footer("--root DIR may stand anywhere on the line. See tavrelctl(1).");
+  app.footer("--root DIR may appear anywhere on the line. See tavrelctl(1).");
   app.set_version_flag("--version", "tavrelctl " + std::string(version()));
   app.add_option_function<std::string>(
          "--root",
@@ -58,7 +58,7 @@ void addGlobalOptions(CLI::App& app, ToolContext& context) {
 }
 
 void run(const std::vector<std::string>& arguments, ToolContext& context) {
-  CLI::App app("Looks into tavrel and the statistics that it reports.", "tavrelctl");
+  CLI::App app("Inspects tavrel and the statistics that it reports.", "tavrelctl");
   addGlobalOptions(app, context);
   const Command top(app);
   addStatusCommand(top, context);

@@ -103,8 +103,8 @@ class BinaryReader {
 
 bool BinaryReader::readTrailer() {
   if (bytes_.size() > limits::kPropertyListBytes) {
-    error_ = format("binary property list: %zu bytes are more than the %zu that are read",
-                    bytes_.size(), limits::kPropertyListBytes);
+    error_ = format("binary property list: it has %zu bytes; the limit is %zu", bytes_.size(),
+                    limits::kPropertyListBytes);
     return false;
   }
   if (!asText(bytes_).starts_with(kHeader)) return fail(0, "it does not begin with \"bplist00\"");
@@ -122,7 +122,7 @@ bool BinaryReader::readTrailer() {
   for (const std::size_t field : {kOffsetWidthAt, kReferenceWidthAt}) {
     const auto width = std::to_integer<unsigned>(at[field]);
     if (width < 1 || width > 8) {
-      return fail(trailer + field, format("%u is no width from 1 to 8 bytes", width));
+      return fail(trailer + field, format("%u is not a width from 1 to 8 bytes", width));
     }
   }
   if (tableOffset < kHeader.size() || tableOffset > trailer) {
@@ -152,7 +152,7 @@ bool BinaryReader::open(const Reference& reference, Object& object) {
   const std::size_t entry = objectsEnd_ + static_cast<std::size_t>(reference.number) * offsetWidth_;
   const std::uint64_t offset = loadWord(bytes_.data() + entry, offsetWidth_);
   if (offset < kHeader.size() || offset >= objectsEnd_) {
-    return fail(entry, format("object %llu stands at offset %llu, outside the objects",
+    return fail(entry, format("object %llu is at offset %llu, outside the objects",
                               reference.number, offset));
   }
   object.offset = static_cast<std::size_t>(offset);
@@ -168,7 +168,7 @@ bool BinaryReader::readLength(Object& object) {
   const auto marker = std::to_integer<std::uint8_t>(bytes_[object.content]);
   const unsigned exponent = marker & kLengthMask;
   if ((marker & kTypeMask) != kInteger || exponent > 3) {
-    return fail(object.content, "the length of an object is no integer of 1 to 8 bytes");
+    return fail(object.content, "the length of an object is not an integer of 1 to 8 bytes");
   }
   const std::size_t width = std::size_t{1} << exponent;
   ++object.content;
@@ -214,7 +214,7 @@ bool BinaryReader::readValue(const Reference& reference, Value& out) {
       out = object.marker == kTrue;
       return true;
   }
-  return fail(object.offset, format("marker 0x%02x is of no type that is read", object.marker));
+  return fail(object.offset, format("marker 0x%02x is of an unknown type", object.marker));
 }
 
 bool BinaryReader::readInteger(const Object& object, Value& out) {
@@ -299,7 +299,7 @@ bool BinaryReader::readKey(const Reference& reference, String& out) {
   Object object;
   if (!open(reference, object)) return false;
   const unsigned type = object.marker & kTypeMask;
-  if (type != kAscii && type != kUtf16) return fail(object.offset, "a key is no text");
+  if (type != kAscii && type != kUtf16) return fail(object.offset, "a key is not a string");
   return readText(reference, object, out);
 }
 

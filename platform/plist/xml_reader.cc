@@ -182,8 +182,8 @@ void XMLCALL onSkippedEntity(void* reader, const XML_Char* name, int) noexcept {
 
 Expected<Value> XmlReader::read(ByteSpan bytes) {
   if (bytes.size() > limits::kPropertyListBytes) {
-    return Error{format("XML property list: %zu bytes are more than the %zu that are read",
-                        bytes.size(), limits::kPropertyListBytes)};
+    return Error{format("XML property list: it has %zu bytes; the limit is %zu", bytes.size(),
+                        limits::kPropertyListBytes)};
   }
   parser_.reset(XML_ParserCreate(nullptr));
   if (!parser_) throw std::bad_alloc();
@@ -226,7 +226,7 @@ void XmlReader::startElement(std::string_view name) {
     return fail("<" + excerpt(name) + "> is no element of property lists");
   }
   if ((element == Element::Plist) == insidePlist_) {
-    return fail(insidePlist_ ? "<plist> stands inside <plist>"
+    return fail(insidePlist_ ? "<plist> is inside another <plist>"
                              : "<" + excerpt(name) + "> stands where <plist> should");
   }
   if (element == Element::Plist) {
@@ -269,7 +269,7 @@ void XmlReader::endElement() {
   } else if (!containers_.empty()) {
     endContainer();
   } else if (root_.isNull()) {
-    fail("<plist> holds no value");
+    fail("<plist> contains no value");
   }
 }
 
@@ -283,13 +283,13 @@ void XmlReader::endScalar() {
       return add(text_);
     case Element::Integer:
       if (const auto number = parseInteger(trimmed(text_))) return add(*number);
-      return fail("\"" + excerpt(text_) + "\" is no integer of 64 bits");
+      return fail("\"" + excerpt(text_) + "\" is not a 64-bit integer");
     case Element::Real:
       if (const auto number = parseReal(trimmed(text_))) return add(*number);
-      return fail("\"" + excerpt(text_) + "\" is no real number that a double holds");
+      return fail("\"" + excerpt(text_) + "\" is not a number in the range of a double");
     case Element::Date:
       if (const auto date = parseIsoInstant(trimmed(text_))) return add(*date);
-      return fail("\"" + excerpt(text_) + "\" is no date of the form YYYY-MM-DDTHH:MM:SSZ");
+      return fail("\"" + excerpt(text_) + "\" is not a date of the form YYYY-MM-DDTHH:MM:SSZ");
     case Element::Data:
       if (readBase64(text_, data_)) return add(Data(data_));
       return fail("the text of <data> is not base64");

@@ -48,7 +48,7 @@ class XmlWriter {
       case Kind::Date:
         open("date");
         if (!appendIsoInstant(out_, *value.date()))
-          return guard_.fail("no calendar reaches the date");
+          return guard_.fail("the date is beyond any calendar");
         close("date");
         break;
       case Kind::String:

@@ -114,7 +114,7 @@ TEST_F(ListenerTest, IgnoresWhatNobodyAskedFor) {
   EXPECT_EQ(serve({{}, kAnnounce}).size(), 3U);
   EXPECT_EQ(serve({Dictionary{{"operation", 3}}, kAnnounce}), Messages{});
   EXPECT_EQ(fake.log.messages(LogLevel::Debug),
-            Messages{"ignored operation 0: this process has had its one request"});
+            Messages{"ignored operation 0: this process has already acted on a request"});
 }
 
 TEST_F(ListenerTest, ForcesADayOnce) {

@@ -73,7 +73,7 @@ TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
   EXPECT_FALSE(storedDay());
   EXPECT_EQ(fake.journal.back(), "synchronize com.norvane.tallied.tavrel");
   EXPECT_EQ(fake.log.messages().back(),
-            "the statistics of the run are not kept: day 19999 stays undone");
+            "the run's statistics could not be saved: the next run repeats day 19999");
 }
 
 TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
@@ -100,13 +100,15 @@ TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
 }
 
 TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
-  // The last column is the days that are said to be missing.
+  // The last column is what is said about missing days.
   using Case = std::tuple<plist::Value, std::int32_t, std::string>;
   for (const auto& [stored, today, days] :
        {Case({}, 20000, ""), Case("19000", 20000, ""), Case(19998, 20000, ""),
-        Case(19997, 20000, "1 (19998 to 19998)"), Case(16339, 20000, "3659 (16340 to 19998)"),
-        Case(16338, 20000, ""), Case(-3, 2, "3 (-2 to 0)"), Case(std::int64_t{1} << 40, 20000, ""),
-        Case(INT64_MIN, 20000, ""), Case(0, INT32_MIN, "")}) {
+        Case(19997, 20000, "1 day had no run and will not be reported: 19998"),
+        Case(16339, 20000, "3659 days had no run and will not be reported: 16340 to 19998"),
+        Case(16338, 20000, ""), Case(-3, 2, "3 days had no run and will not be reported: -2 to 0"),
+        Case(std::int64_t{1} << 40, 20000, ""), Case(INT64_MIN, 20000, ""),
+        Case(0, INT32_MIN, "")}) {
     fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);
     fake.store.today = today;
     fake.log.entries.clear();
@@ -114,8 +116,7 @@ TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
     Messages info = fake.log.messages(LogLevel::Info);
     ASSERT_FALSE(info.empty());
     info.pop_back();  // why there is no log
-    const std::string text = "days without a run that will not be reported: " + days;
-    EXPECT_EQ(info, days.empty() ? Messages{} : Messages{text}) << textOf(stored) << " " << today;
+    EXPECT_EQ(info, days.empty() ? Messages{} : Messages{days}) << textOf(stored) << " " << today;
   }
 }
 
@@ -179,7 +180,8 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   for (const char* help : {"-h", "--help"}) {
     run({"tavrel", help});
     EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + help);
-    EXPECT_TRUE(fake.streams.output.starts_with("Usage: tavrel [-d | -f | -t]\n\n"));
+    EXPECT_TRUE(
+        fake.streams.output.starts_with("Usage: tavrel [-d | -f | -t | -h | --version]\n\n"));
     fake.streams.output.clear();
   }
   run({"tavrel", "--version"});

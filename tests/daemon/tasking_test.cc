@@ -94,14 +94,14 @@ TEST_F(TaskingTest, AppliesNothingThatItCouldNotUndo) {
   using Case = std::pair<plist::Value, std::string>;
   for (const auto& [value, why] :
        {Case(plist::Date::sinceEpoch(std::nan("")),
-             "cannot encode the property list, value /TaskingPayload/0/Value: no calendar reaches "
-             "the date"),
-        Case(std::string(1048259, 'x'), "it needs 1048577 bytes and may have 1048576")}) {
+             "cannot encode the property list, value /TaskingPayload/0/Value: the date is beyond "
+             "any calendar"),
+        Case(std::string(1048259, 'x'), "it needs 1048577 bytes; the limit is 1048576")}) {
     schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", value)}}});
     EXPECT_EQ(track(), Journal{});
     EXPECT_EQ(fake.log.messages(),
               Messages{"cannot apply ScheduledTasking of domain com.norvane.Drovelink: " + why +
-                       "; schedule one that preferences can hold"});
+                       "; schedule one that preferences can store"});
   }
   const std::string most(1048258, 'x');
   schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", most)}}});

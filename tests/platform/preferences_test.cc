@@ -104,7 +104,7 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   EXPECT_TRUE(process.synchronize());
   EXPECT_EQ(process.log.lines.size(), 4U);
   EXPECT_TRUE(process.log.says(
-      "cannot write preference \"large8\" of domain com.example.domain: with it the "));
+      "cannot write preference \"large8\" of domain com.example.domain: the file "));
   Process later(device.root);
   EXPECT_EQ(later.get("gate") + later.get("good"), "207832");
   EXPECT_EQ(later.get("large7").size(), 1007U << 10);
@@ -121,7 +121,7 @@ TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
   ASSERT_EQ(process.log.lines.size(), 5U);
   EXPECT_EQ(process.log.lines[1],
             "cannot set preference \"k\": \".hidden\" is not the name of a domain; use 1 to 200 "
-            "characters without slash, control character or a dot in front");
+            "characters, no slash or control character, and no dot in front");
   EXPECT_TRUE(fs::is_empty(device.root.path("/")));
   for (const std::size_t excess : {0U, 1U}) {
     const std::string name(limits::kPreferenceDomainBytes + excess, 'd');

@@ -419,13 +419,15 @@ TEST_F(RegistryTest, TheHubRefusesWhatTheRecordingRefuses) {
   EXPECT_EQ(client.update(), "1/1*1=4 ");
   ASSERT_EQ(log.lines.size(), 9U);
   for (const auto& [line, text] :
-       {std::pair(4U,
-                  "4 is left out: its \"Elements\" are not groups of it; give elements of 64 "
-                  "bytes with its ids, the first with their number at offset 20"),
+       {std::pair(
+            4U,
+            "4 is left out: its \"Elements\" are not groups of this channel; give elements of 64 "
+            "bytes with its ids, the first with their number at offset 20"),
         std::pair(5U, "5 is left out: it has no \"DriverID\" or no \"ChannelID\"; give integers"),
-        std::pair(7U,
-                  "8 is left out: an earlier one has its ids; give each channel of a driver "
-                  "its own")})
+        std::pair(
+            7U,
+            "8 is left out: an earlier channel has the same ids; give each channel of a driver "
+            "its own")})
     EXPECT_EQ(log.lines[line], std::string("recording: hub channel ") + text);
   RecordedRegistry empty(Dictionary::create(), log);
   EXPECT_EQ(empty.firstService("IOReportHub"), nullptr);

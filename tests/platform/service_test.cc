@@ -247,8 +247,9 @@ TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
   const std::string socket = serviceSocketPath(*root, kName);
   EXPECT_EQ(inChild([this] { return services->createListener(kName).release() ? 0 : 1; }), 0);
   ASSERT_TRUE(std::filesystem::exists(socket)) << "as after a kill";
-  EXPECT_EQ(ServiceClient::connect(*root, kName).error().message,
-            "cannot connect to " + socket + ": Connection refused; is the service started?");
+  EXPECT_EQ(
+      ServiceClient::connect(*root, kName).error().message,
+      "cannot connect to " + socket + ": Connection refused; start tavrel or its socket unit");
   listen();
   EXPECT_TRUE(refusesToListen("cannot listen at " + socket + ": another process listens there"));
   ASSERT_TRUE(connect().send({{"operation", 0}}));
@@ -307,7 +308,7 @@ TEST_F(ServiceTest, TakesOverTheServiceManagersSocket) {
       return takeOver(good, good, process, fdNames, [&] { return refusesToListen(why); });
     });
   };
-  EXPECT_EQ(refusal(nullptr, "a:b", "can be told to be"), 0);
+  EXPECT_EQ(refusal(nullptr, "a:b", "is known to be"), 0);
   EXPECT_EQ(refusal("1", kName.data(), "another process listens there"), 0)
       << "meant for another process";
 }

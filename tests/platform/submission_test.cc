@@ -85,7 +85,7 @@ TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
       const bool filed = service.file();
       if (!filed) {
         ASSERT_FALSE(service.log.lines.empty());
-        EXPECT_EQ(service.log.lines.back().find("log \"log-tallied\" is not filed: cannot "), 0U);
+        EXPECT_EQ(service.log.lines.back().find("cannot file log \"log-tallied\": cannot "), 0U);
         EXPECT_TRUE(!faulty.goesOn() || filesPending(device) == 0) << "nothing of it is left";
       }
       service.submission.submitDiagnosticLogs();

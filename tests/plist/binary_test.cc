@@ -104,7 +104,7 @@ TEST(Binary, HostileObjectsAreRefused) {
     expanding.push_back("\xAA"s + std::string(10, i));
   expanding.push_back("\x09"s);
   const std::pair<std::vector<std::string>, std::string> rows[] = {
-      {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of no type that is read"},
+      {{"\x32\1\1\1\1"s}, "8: marker 0x32 is of an unknown type"},
       {{"\x15"s}, "8: an integer of more than 16 bytes"},
       {{"\x14\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF\1\0\0\0\0\0\0\0"s}, "8: an integer beyond 64 bits"},
       {{"\x21\0\0"s}, "8: a real of neither 4 nor 8 bytes"},
@@ -112,11 +112,11 @@ TEST(Binary, HostileObjectsAreRefused) {
       {{"\x62\0a\0"s}, "8: the object does not end before the table of offsets"},
       {{"\x4F\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
        "8: the object does not end before the table of offsets"},
-      {{"\x4F\x22\0\0\0\1"s}, "9: the length of an object is no integer of 1 to 8 bytes"},
+      {{"\x4F\x22\0\0\0\1"s}, "9: the length of an object is not an integer of 1 to 8 bytes"},
       {{"\xD1\1"s}, "8: the object does not end before the table of offsets"},
       {{"\x51\xE9"s}, "8: a byte of a text is not ASCII"},
       {{"\xA1\1"s}, "9: a reference to object 1, where there are 1"},
-      {{"\xD1\1\1"s, "\x09"s}, "11: a key is no text"},
+      {{"\xD1\1\1"s, "\x09"s}, "11: a key is not a string"},
       {{"\xA1\1"s, "\xD1\2\0"s, "\x51\x61"s}, "8: a container contains itself"},
       {expanding, "85: there are more than 1000000 values, after shared references are expanded"}};
   for (const auto& [objects, error] : rows)
@@ -141,8 +141,8 @@ TEST(Binary, HostileTrailersAreRefused) {
   ASSERT_EQ(errorOf(good), "no error");
   const std::tuple<std::size_t, std::string, std::string> rows[] = {
       {0, "bplist15", "0: it does not begin with \"bplist00\""},
-      {16, "\0"s, "16: 0 is no width from 1 to 8 bytes"},
-      {16, "\x09", "16: 9 is no width from 1 to 8 bytes"},
+      {16, "\0"s, "16: 0 is not a width from 1 to 8 bytes"},
+      {16, "\x09", "16: 9 is not a width from 1 to 8 bytes"},
       {16, "\2"s, "18: the table of offsets has no room for 1 objects"},
       {18, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "18: the table of offsets has no room for 18446744073709551615 objects"},
@@ -150,7 +150,7 @@ TEST(Binary, HostileTrailersAreRefused) {
       {34, "\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s,
        "34: the table of offsets begins at 18446744073709551615, outside the document"},
       {34, "\0\0\0\0\0\0\0\x0A"s, "18: the table of offsets has no room for 1 objects"},
-      {9, "\x09"s, "9: object 0 stands at offset 9, outside the objects"}};
+      {9, "\x09"s, "9: object 0 is at offset 9, outside the objects"}};
   for (const auto& [at, change, error] : rows) {
     std::string bytes = good;
     bytes.replace(at, change.size(), change);

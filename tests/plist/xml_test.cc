@@ -105,7 +105,7 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
       {Dictionary{{"a", Array{1, Value()}}},
        "cannot encode the property list, value /a/1: null has no encoding"},
       {Date::sinceEpoch(1e300),
-       "cannot encode the property list, value /: no calendar reaches the date"},
+       "cannot encode the property list, value /: the date is beyond any calendar"},
       {Value(cyclic),
        "cannot encode the property list: containers nest deeper than 128, or one contains itself"},
       {large, "cannot encode the property list: the document is longer than 67108864 bytes"}};
@@ -138,26 +138,26 @@ TEST(Xml, ReadsWhatOthersWrite) {
 
 TEST(Xml, ErrorsSayWhatAndWhere) {
   const std::pair<std::string, std::string> rows[] = {
-      {"", "1: <plist> holds no value"},
+      {"", "1: <plist> contains no value"},
       {"<true/><true/>", "8: <true> is a second value"},
       {"<key>a</key>", "1: <key> stands outside <dict>"},
       {"<dict><key>a</key></dict>", "19: the last <key> of a <dict> has no value"},
       {"<dict><key>a</key><key>b</key></dict>", "19: <key> stands where the value of a key should"},
       {"<string>a<true/></string>", "10: <true> stands where only text may"},
       {"<array>x</array>", "8: text stands outside an element that holds text"},
-      {"<integer>--1</integer>", "13: \"--1\" is no integer of 64 bits"},
+      {"<integer>--1</integer>", "13: \"--1\" is not a 64-bit integer"},
       {"<integer>" + std::string(59, '9') + "\xC3\xA9</integer>",
-       "70: \"" + std::string(59, '9') + "...\" is no integer of 64 bits"},
+       "70: \"" + std::string(59, '9') + "...\" is not a 64-bit integer"},
       {"<integer>18446744073709551616</integer>",
-       "30: \"18446744073709551616\" is no integer of 64 bits"},
-      {"<real>1e999</real>", "12: \"1e999\" is no real number that a double holds"},
+       "30: \"18446744073709551616\" is not a 64-bit integer"},
+      {"<real>1e999</real>", "12: \"1e999\" is not a number in the range of a double"},
       {"<date>2026-02-29T00:00:00Z</date>",
-       "27: \"2026-02-29T00:00:00Z\" is no date of the form YYYY-MM-DDTHH:MM:SSZ"},
+       "27: \"2026-02-29T00:00:00Z\" is not a date of the form YYYY-MM-DDTHH:MM:SSZ"},
       {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"}};
   for (const auto& [body, reason] : rows)
     EXPECT_EQ(errorOf(wrapped(body)), "XML property list, line 3, column " + reason) << body;
   EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
-            "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is no integer of 64 bits");
+            "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is not a 64-bit integer");
   EXPECT_EQ(errorOf("<dict/>"),
             "XML property list, line 1, column 1: <dict> stands where <plist> should");
   EXPECT_EQ(errorOf("<!DOCTYPE p [<!ENTITY a \"b\">]><plist><string>&a;</string></plist>"),

@@ -7,7 +7,7 @@ namespace {
 TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const TemporaryDevice device;
   const std::string kNoXmlText =
-      "cannot be stored: property lists contain no control characters and only UTF-8: give such "
+      "cannot be stored: property lists allow only UTF-8 without control characters: give such "
       "bytes "
       "as --plist '{\"$data\": \"BASE64\"}'";
   const std::pair<CommandLine, std::string> kCases[] = {
@@ -25,7 +25,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {"prefs set a k\xff x", kNoXmlText},
       {"prefs set a k [{\"\xEF\xBF\xBE\":1}] --plist", kNoXmlText},
       {"prefs set a k @1e300 --date",
-       "cannot be stored: cannot encode the property list, value /: no calendar reaches the date"},
+       "cannot be stored: cannot encode the property list, value /: the date is beyond any "
+       "calendar"},
       {"prefs set a k 1 --int --bool",
        "Requires at most 1 options be given from [--string,--bool,--int,--float,--date,--plist]: "
        "see "
@@ -205,8 +206,8 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
   for (const auto& [change, why] : kCases) {
     if (change.starts_with("delete")) device.write(kWhitelistFile, xmlOf("{}"));
     device.run("prefs " + change);
-    device.check("log show", fails("no daily log is here; " + why +
-                                   "; 'tavrelctl log preview' shows what a log would hold"));
+    device.check("log show", fails("no daily log found; " + why +
+                                   "; 'tavrelctl log preview' shows what a log would contain"));
   }
 }
 
@@ -311,11 +312,10 @@ line two
   EXPECT_EQ(mistyped["faults"], R"([
       "BHDistributions/b: is not a summary of five numbers",
       "BHDistributionsHistogram/a/(1, 2]: is a string, not a number",
-      "BHDistributionsHistogram/c: belongs to no summary in BHDistributions",
+      "BHDistributionsHistogram/c: has no summary in BHDistributions",
       "BHOther: is not part of a tallied log",
       "BHScalars: is a string, not a dictionary"])"_json);
-  EXPECT_NE(device.run("log show")
-                .out.find("\nNot as a tallied log has it (5)\n  BHDistributions/b: is no"),
+  EXPECT_NE(device.run("log show").out.find("\nFormat faults (5)\n  BHDistributions/b: is no"),
             std::string::npos);
   device.check("log show " + other,
                fails("not a tallied log: " + other + ": 'tavrelctl plist show FILE' shows it"));
@@ -355,9 +355,9 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   const Outcome outcome = device.run("status");
   EXPECT_EQ(outcome.status, 0) << outcome;
   for (const auto& line :
-       {"Submission         allowed\n", "Last reported day  20001 (2024-10-05)\n",
-        "Last OS version    none yet\n", " bytes, day 20000 (2024-10-04)\n",
-        "Pending logs       1\nLast run           day 20001 (2024-10-05), outcome unknown\n"}) {
+       {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
+        "Last OS version  none yet\n", "Store            256.0 KiB, day 20000 (2024-10-04)\n",
+        "Pending logs     1\nLast run         day 20001 (2024-10-05), outcome unknown\n"}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
   }
   EXPECT_EQ(

@@ -17,9 +17,10 @@ struct SilentLog final : SystemLog {
 
 TEST(Send, SendsWhatTheServiceUnderstands) {
   const TemporaryDevice device;
-  device.check("send announce", fails("cannot connect to " +
-                                      device.path("/run/tavrel/com.norvane.tallied.tavrel.socket") +
-                                      ": No such file or directory; is the service started?"));
+  device.check(
+      "send announce",
+      fails("cannot connect to " + device.path("/run/tavrel/com.norvane.tallied.tavrel.socket") +
+            ": No such file or directory; start tavrel or its socket unit"));
 
   const DeviceRoot root(device.path(""));
   SilentLog log;
@@ -39,8 +40,8 @@ TEST(Send, SendsWhatTheServiceUnderstands) {
   EXPECT_EQ(device.run("send announce").status, 0);
   device.check("send force 2026-11-16",
                (Outcome{0, "Asked for the daily tasks of day 20773 (2026-11-16).\n",
-                        "tavrelctl: the service acts on one request in its life: it ignores this "
-                        "one if it has had another before\n"}));
+                        "tavrelctl: a service process acts on one request: it ignores this one if "
+                        "another came first\n"}));
   EXPECT_EQ(device.run("send deliver -",
                        R"([{"bundle_id": "org.example", "version": "1", "arch": 12,
                             "uuid": "00112233-4455-6677-8899-aABBccddEEff"}])"),
@@ -60,7 +61,7 @@ TEST(Send, ChecksApplicationsBeforeItSends) {
   const std::string good = R"("bundle_id": "a", "version": "1", "orbo_id": 1, "arch": 1)";
   const TemporaryDevice device;
   const std::vector<std::pair<std::string, std::string>> cases = {
-      {"{}", "no array of applications"},
+      {"{}", "not an array of applications"},
       {"[1]", "element 0 is not a dictionary"},
       {R"([{"version": "1"}])", "application 0: \"bundle_id\" must be a string"},
       {R"([{"bundle_id": "a", "version": "1", "orbo_id": 1.5}])",
@@ -124,9 +125,9 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
     "applied": {"TaskingID": "t1", "TaskingOS": "B1", "TaskingDigest": null,
                 "TaskingPayload": null},
     "LastOSUpdate": {"day": 20000, "version": "B1"},
-    "next_run": "takes the applied tasking back and applies the scheduled one"})"_json);
+    "next_run": "undoes the applied tasking and applies the scheduled one"})"_json);
   device.check("tasking clear",
-               prints("Removed scheduled tasking t2. Settings that were applied stay in force.\n"));
+               prints("Removed scheduled tasking t2. Settings already applied stay in force.\n"));
   EXPECT_TRUE(device.run("tasking show").out.starts_with("Scheduled tasking: none\n"));
 }
 
@@ -139,14 +140,15 @@ TEST_F(TaskingTest, SaysWhatTheDaemonWouldDo) {
   EXPECT_EQ(nextRun(R"({"TaskingID": 4})"), "changes nothing");
   EXPECT_EQ(nextRun(R"({"TaskingID": "t", "TaskingPayload": [], "TaskingDigest": ")" +
                     std::string(1U << 20, 'x') + "\"}"),
-            "refuses the scheduled tasking, which preferences cannot hold");
+            "refuses the scheduled tasking, which preferences cannot store");
 }
 
 TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
   const std::pair<const char*, std::vector<std::string>> cases[] = {
       {"[1]", {"tasking: must be a dictionary, not an array"}},
       {R"({"TaskingId": "x"})",
-       {"TaskingId: has no meaning; a device knows TaskingID, TaskingDigest, TaskingPayload",
+       {"TaskingId: is not a known key; the known ones are TaskingID, TaskingDigest, "
+        "TaskingPayload",
         "TaskingID: is missing"}},
       {R"({"TaskingID": "", "TaskingPayload": {}})",
        {"TaskingID: must not be empty", "TaskingPayload: must be an array, not a dictionary"}},
@@ -156,7 +158,7 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
        {"TaskingID: must be a string, not an integer",
         "TaskingPayload[0]: must be a dictionary, not an integer",
         "TaskingPayload[1]/Domain: is not the name of a preference domain",
-        "TaskingPayload[2]/value: has no meaning; a device knows Domain, Key, Value",
+        "TaskingPayload[2]/value: is not a known key; the known ones are Domain, Key, Value",
         "TaskingPayload[2]/Domain: is missing", "TaskingPayload[2]/Value: is missing",
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",

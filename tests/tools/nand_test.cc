@@ -50,7 +50,7 @@ TEST(NandInfo, GroupsWhatTheDriverAnswers) {
   DriverVersion      -1
 
 Geometry
-  NumVirtualBlocks       1024  of 32.0 MiB, 32.0 GiB in all
+  NumVirtualBlocks       1024  of 32.0 MiB, 32.0 GiB in total
   PagesPerVirtualBlock   2048
   BytesPerPage          16384
   NumFreeVirtualBlocks     93  9.1 %
@@ -128,8 +128,8 @@ readCountHisto1                     2
 readCountHisto2                     3
 ECBins                              9
 )",
-                     "tavrelctl: standard input: 2 records not wholly listed: of unknown "
-                     "statistics, without values or with too many: --json prints them whole\n"}));
+                     "tavrelctl: standard input: 2 records not listed in full: of unknown "
+                     "statistics, without values or with too many: --json prints them in full\n"}));
   const Outcome parsed = device.run("nand parse - --json", first + "\xab");
   EXPECT_EQ(device.run("nand build - -o -", parsed.out), prints(first + "\xab"));
   EXPECT_EQ(nlohmann::json::parse(parsed.out), R"({"format_version": 1, "result": 1, "fields": {
@@ -164,9 +164,10 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
         second + "0x30000001 is above 0x30000000, the largest number of a statistic");
   parse(good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])", 1,
         second + "statistic 54 has 4294967295 values, but there is room for 1");
-  EXPECT_EQ(device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
-            "tavrelctl: standard input: 1 record not wholly listed: of unknown statistics, without "
-            "values or with too many: --json prints them whole\n");
+  EXPECT_EQ(
+      device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
+      "tavrelctl: standard input: 1 record not listed in full: of unknown statistics, without "
+      "values or with too many: --json prints them in full\n");
   EXPECT_EQ(
       device.run("nand parse -", words({4, 1, 1, 0, 0})),
       (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",
@@ -195,7 +196,7 @@ ECBins            -                     1
   EXPECT_EQ(json["differences"][4].dump(),
             R"({"after":18446744073709551615,"before":0,"change":null,"statistic":"shutdowns"})");
   EXPECT_EQ(device.run("nand parse " + device.path("/a") + " --diff " + device.path("/a")),
-            prints("no differences among the statistics that have a name\n"));
+            prints("no differences among named statistics\n"));
 }
 
 TEST(NandBuild, NamesThePlaceOfAMistake) {
@@ -217,7 +218,7 @@ entries[1]: no statistic is named "bots": give the number of one that is not kno
 entries[0]: 1 members: give a statistic and its value, or a list of its values
 entries[0]: -1 is not a value: give an integer from 0 to 2^64 - 1
 entries[0]: 1.5 is not a value: give an integer from 0 to 2^64 - 1
-entries[0]: 4294967296 names no statistic: give its name, or its number of at most 32 bits
+entries[0]: 4294967296 is not a statistic: give its name or its 32-bit number
 entries[2]: ECBins1 does not follow ECBins0: give the elements from 0 on, one after the other, or a list
 entries[0]: "sum" is not a member of a record: it has key, count and values
 entries[0]: "count": 4294967296 is not an integer from 0 to 2^32 - 1

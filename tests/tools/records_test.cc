@@ -48,13 +48,14 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
   const Outcome all = device.run("records show");
   EXPECT_EQ(
       all,
-      (Outcome{1,
-               "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
-               "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
-               "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n",
-               torn + "tavrelctl: 3 lines skipped, not a record; the first is line 2 of " +
-                   device.path(kRecords) +
-                   "172-2026-11-27.jsonl: no object with \"time\", \"type\" and \"record\"\n"}));
+      (Outcome{
+          1,
+          "2026-11-27T03:00:00.000Z  176  Factory Count=7\n"
+          "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n"
+          "2026-11-27T18:02:18.250Z  172  id=4 count=2 reg0=18446744073709551615 reg1=-1\n",
+          torn + "tavrelctl: 3 lines skipped, not a record; the first is line 2 of " +
+              device.path(kRecords) +
+              "172-2026-11-27.jsonl: not an object with \"time\", \"type\" and \"record\"\n"}));
   EXPECT_EQ(device.run("records show --day 2026-11-02").out,
             all.out.substr(0, all.out.find('\n') + 1));
   EXPECT_EQ(device.run("records show --type 176 --day 20784", "", 48).out,
@@ -142,9 +143,9 @@ TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
 TEST(Nandlog, ShowsTheNewestLogAndWhenTheNextMayBeWritten) {
   const TemporaryDevice device;
   device.check("nandlog show",
-               {1, "Next log        the next run may write one; none was written so far\n",
-                "tavrelctl: no NAND log waits or was sent on: one is written when the write "
-                "amplification is high\n"});
+               {1, "Next log        the next run may write one; none has been written yet\n",
+                "tavrelctl: no NAND log found: a run writes one when write amplification is "
+                "high\n"});
   const std::string outbox = device.path(kSubmission) + "outbox/";
   const auto file = [&](const std::string& name, const char* type, const std::string& text) {
     device.fileLog("outbox/" + name, text,

@@ -131,17 +131,17 @@ Report channels
   looks for drivers {"IOPropertyMatch": {"IOReportLegendPublic": true}}: answered
 
 Clean-up of structured records
-  would remove files of old structured records: ["172-1999-01-01.jsonl"]
+  would remove old files of structured records: ["172-1999-01-01.jsonl"]
 
-Changes of the system, and tasking
+OS changes and tasking
   reads system version: {"ProductBuildVersion": "8B"}
   logs default: OS change since last run ((null) -> 8B)
 
 Roll-over of the support log
-  would roll nothing: the support log is empty or not there
+  would roll nothing: the support log is empty or missing
 
-In all it would write: 3 preferences, 17 scalars, 4 structured records, 2 logs
---verbose shows everything, and what logs hold.
+In total it would write: 3 preferences, 17 scalars, 4 structured records, 2 logs
+--verbose shows everything, with the content of logs.
 It would file a log for day TODAY (DATE)
 )text";
 
@@ -171,7 +171,7 @@ TEST(Rehearse, GatedRunStopsWhereItsDayIsDone) {
   const Rehearsed device;
   EXPECT_NE(device.text("").find(R"(
 Roll-over of the support log
-  would roll nothing: the support log is empty or not there
+  would roll nothing: the support log is empty or missing
 
 End of the gated run
   would checkpoint the statistics store
@@ -180,7 +180,7 @@ End of the gated run
   would set preference com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 = YESTERDAY
   would write preferences of com.norvane.tallied.tavrel
 
-In all it would write: 4 preferences,)"),
+In total it would write: 4 preferences,)"),
             std::string::npos);
   device.run("prefs set com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 " +
              device.today["day"].dump() + " --int");
@@ -191,8 +191,8 @@ Once-a-day gate
   reads preference com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970: TODAY
   logs default: Day unchanged since last run
 
-In all it would write: nothing
-It would file no log: the run for day YESTERDAY (DATE) is done
+In total it would write: nothing
+It would file no log: the run for day YESTERDAY (DATE) is already done
 )");
 }
 

@@ -170,7 +170,7 @@ TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
   play(recorded);
   device.check("report sample --group NAND --category 1 --delta --interval 0 --unit 4KiB",
                {0, "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0 MiB\n",
-                "tavrelctl: 1 channel without a change that can be told, left out; the first is "
+                "tavrelctl: 1 channel left out, as the change is unknown; the first is "
                 "flash0 <id 0x100000201> NAND Traffic Host reads: a value is not set, or their "
                 "number changed\n"});
 }
@@ -208,7 +208,7 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
                    "registry list' shows the drivers and the hub"},
       {forgetful, "sample", 0, "1 channel without values: the hub does not know them"},
       {badLegend, "list", 0,
-       "radio0 <id 0x100000202>: bad legend\ntavrelctl: such drivers are left out: 'tavrelctl "
+       "radio0 <id 0x100000202>: bad legend\ntavrelctl: these drivers are left out: 'tavrelctl "
        "registry show ID' shows what they publish"},
       {noHub, "sample --group None", 1,
        "no such channel is published: 'tavrelctl report list' shows what there is"},

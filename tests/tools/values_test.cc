@@ -44,10 +44,10 @@ TEST(JsonValue, EveryValueReadsBackEqual) {
 
 TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
   const std::pair<std::string, std::string> kCases[] = {
-      {R"({"a": {"b": null}})", "JSON/a/b: null has no place in a property list"},
+      {R"({"a": {"b": null}})", "JSON/a/b: a property list cannot contain null"},
       {"18446744073709551616", "JSON: the integer 18446744073709551616 does not fit 64 bits"},
       {R"({"$data": "?"})", "JSON/$data: \"$data\" is not base64"},
-      {R"({"$real": "1"})", "JSON/$real: \"$real\" is none of \"nan\", \"inf\", \"-inf\""},
+      {R"({"$real": "1"})", "JSON/$real: \"$real\" is not one of \"nan\", \"inf\", \"-inf\""},
       {R"({"$date": "today"})",
        "JSON/$date: not a date: today: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD"},
       {R"({"$data": "", "x": 1})",
@@ -149,9 +149,9 @@ TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
     quantities += quantityText(value, unit) + "; ";
   EXPECT_EQ(quantities,
             "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; ");
-  for (const double bytes : {0.0, 1023.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
+  for (const double bytes : {0.0, 1.0, 1023.0, 1024.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
     sizes += sizeText(bytes) + "; ";
-  EXPECT_EQ(sizes, "0 bytes; 1023 bytes; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");
+  EXPECT_EQ(sizes, "0 bytes; 1 byte; 1023 bytes; 1.0 KiB; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");
 }
 
 TEST(ValueText, ShowsTheKindOfAValue) {

@@ -46,10 +46,10 @@ D: is a boolean: a group is a dictionary of tables: ignored
 A/ScalarKeys/both: is listed by group C too, which comes later and wins
 B/ScalarKeys/both: is listed by group C too, which comes later and wins
 B/ScalarKeyPrefixes/p.: is listed by group C too, which comes later and wins
-B/ScalarKeyPrefixes/: is hidden by the longer prefix B/ScalarKeyPrefixes/p. for the keys that begin so
-C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. for the keys that begin so
-B/ScalarKeyPrefixes/p.q.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q.r for the keys that begin so
-C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s for the keys that begin so
+B/ScalarKeyPrefixes/: is hidden by the longer prefix B/ScalarKeyPrefixes/p. for keys that begin with that
+C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. for keys that begin with that
+B/ScalarKeyPrefixes/p.q.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q.r for keys that begin with that
+C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s for keys that begin with that
 )";
   device.check("whitelist check", (Outcome{1, expected, ""}));
 }

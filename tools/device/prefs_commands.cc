@@ -96,7 +96,7 @@ void set(ToolContext& context, const Arguments& arguments) {
   if (!value) return context.failUsage(value.error().message);
   if (!isXmlText(arguments.key) || !hasXmlTextsOnly(*value)) {
     return context.failUsage(
-        "cannot be stored: property lists contain no control characters and only UTF-8: give such "
+        "cannot be stored: property lists allow only UTF-8 without control characters: give such "
         "bytes as --plist '{\"$data\": \"BASE64\"}'");
   }
   const auto xml = plist::writeXml(*value);

@@ -24,7 +24,7 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kFirstRequestWins =
-    "the service acts on one request in its life: it ignores this one if it has had another before";
+    "a service process acts on one request: it ignores this one if another came first";
 
 bool isInteger(const plist::Value& value) {
   const auto number = value.number();
@@ -116,7 +116,7 @@ void addNotifyCommands(Command app, ToolContext& context) {
 
 Expected<plist::Array> appDataOf(const plist::Value& applications) {
   const plist::Array elements = applications.array();
-  if (!elements) return Error{"no array of applications"};
+  if (!elements) return Error{"not an array of applications"};
   plist::Array result = plist::Array::create(elements.size());
   for (std::size_t i = 0; i < elements.size(); ++i) {
     const plist::Dictionary application = elements.at(i).dictionary();
@@ -154,7 +154,8 @@ void addSendCommands(Command app, ToolContext& context) {
     send(context, {{"operation", kAnnounceAppInfo}}, "Announced app information.");
   });
 
-  const Command forceCommand = group.addCommand("force", "Have the daily tasks of a day run");
+  const Command forceCommand =
+      group.addCommand("force", "Have the service run the daily tasks of a day");
   const auto day = std::make_shared<std::string>();
   forceCommand.addOption("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD").required();
   forceCommand.onRun([&context, day] { force(context, *day); });

@@ -13,6 +13,7 @@
 #include "platform/persisted_state.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -98,7 +99,7 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
 
 std::string storeText(const DeviceStatus& status) {
   if (!status.storeBytes) return "none yet";
-  std::string text = format("%lld bytes", *status.storeBytes);
+  std::string text = sizeText(static_cast<double>(*status.storeBytes));
   if (!status.days) return text + ", unreadable";
   if (!*status.days) return text + ", empty";
   const auto [first, last] = **status.days;
@@ -119,7 +120,7 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   const char* const none = status.isStateReadable ? "none yet" : "unknown";
   table.add({"Submission", submissionCell(status)});
   table.add({"Today", dayText(status.today)});
-  table.add({"Last reported day", status.lastDay ? dayText(*status.lastDay) : none});
+  table.add({"Last day done", status.lastDay ? dayText(*status.lastDay) : none});
   table.add({"Last OS version", status.osVersion.value_or(none)});
   table.add({"Store", storeText(status)});
   table.add({"Store file", status.storePath});
@@ -132,7 +133,8 @@ void printText(ToolContext& context, const DeviceStatus& status) {
 }  // namespace
 
 void addStatusCommand(Command app, ToolContext& context) {
-  const Command command = app.addCommand("status", "Show what tavrel may do, has done and holds");
+  const Command command =
+      app.addCommand("status", "Show the permission, the last run, the store and the pending logs");
   context.addJsonOption(command);
   command.onRun([&context] {
     const DeviceStatus status = takeStatus(context);

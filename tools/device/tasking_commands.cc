@@ -59,9 +59,9 @@ struct Taskings {
       case TaskingChange::Apply:
         return "applies the scheduled tasking";
       case TaskingChange::Replace:
-        return "takes the applied tasking back and applies the scheduled one";
+        return "undoes the applied tasking and applies the scheduled one";
       case TaskingChange::Refuse:
-        return "refuses the scheduled tasking, which preferences cannot hold";
+        return "refuses the scheduled tasking, which preferences cannot store";
     }
     return "";
   }
@@ -170,13 +170,14 @@ void clear(ToolContext& context) {
   }
   if (!store(context, {})) return;
   context.out() << "Removed scheduled tasking " << printable(text(taskings.scheduled.identifier))
-                << ". Settings that were applied stay in force.\n";
+                << ". Settings already applied stay in force.\n";
 }
 
 }  // namespace
 
 void addTaskingCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("tasking", "Settings that the device is tasked with");
+  const Command group =
+      app.addGroup("tasking", "Preference settings that are scheduled for the device");
 
   const Command showCommand =
       group.addCommand("show", "Show the scheduled and the applied tasking");

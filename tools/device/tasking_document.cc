@@ -43,7 +43,7 @@ class Findings {
     for (const plist::Entry& entry : dictionary) {
       const std::string_view key = entry.key.view();
       if (std::find(known.begin(), known.end(), key) != known.end()) continue;
-      std::string message = "has no meaning; a device knows";
+      std::string message = "is not a known key; the known ones are";
       for (const std::string_view name : known) {
         message += name == *known.begin() ? " " : ", ";
         message += name;

@@ -45,7 +45,7 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
     if (!*latest) {
       const LogConclusion conclusion = concludeOnLogs(context);
       return Error{format(
-          "no daily log is here; %s run: %s; 'tavrelctl log preview' shows what a log would hold",
+          "no daily log found; %s run: %s; 'tavrelctl log preview' shows what a log would contain",
           conclusion.run(), conclusion.text())};
     }
     found = std::move(*latest);

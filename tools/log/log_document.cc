@@ -189,7 +189,7 @@ void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictio
   printDistributions(page, distributionsOf(document));
 
   if (const auto faults = faultsOf(document); !faults.empty()) {
-    printTitle(page, "Not as a tallied log has it", faults.size());
+    printTitle(page, "Format faults", faults.size());
     for (const std::string& fault : faults)
       page.out << "  " << printable(fault) << '\n';
   }

@@ -42,7 +42,7 @@ void checkHistogram(const plist::Dictionary& summaries, const plist::Entry& hist
                     std::vector<std::string>& faults) {
   const std::string path = format("BHDistributionsHistogram/%s", histogram.key);
   if (!isSummary(summaries.get(histogram.key))) {
-    faults.push_back(path + ": belongs to no summary in BHDistributions");
+    faults.push_back(path + ": has no summary in BHDistributions");
   }
   const plist::Dictionary buckets = histogram.value.dictionary();
   if (!buckets) faults.push_back(notA(path, histogram.value, "a dictionary"));

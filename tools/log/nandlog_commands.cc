@@ -116,7 +116,7 @@ NextLog nextLog(ToolContext& context) {
 
 std::string textOf(const NextLog& next) {
   if (!next.isKnown) return "unknown";
-  if (!next.last) return "the next run may write one; none was written so far";
+  if (!next.last) return "the next run may write one; none has been written yet";
   if (!next.from) {
     return format("the next run may write one; the last was written %s", dateText(*next.last));
   }
@@ -213,7 +213,7 @@ void show(ToolContext& context) {
   Json document = {{"log", nullptr}, {"next", jsonOf(next)}};
   std::string fault;
   if (!newest) {
-    fault = "no NAND log waits or was sent on: one is written when the write amplification is high";
+    fault = "no NAND log found: a run writes one when write amplification is high";
   } else {
     const LogEnvelope envelope{std::string(nameOf(newest->place)), newest->path, newest->metadata};
     const auto text =
@@ -242,7 +242,8 @@ void show(ToolContext& context) {
 }  // namespace
 
 void addNandlogCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("nandlog", "The weekly text log of the storage's health");
+  const Command group =
+      app.addGroup("nandlog", "The text log of the flash storage's health, at most one a week");
   const Command showCommand =
       group.addCommand("show", "Show the newest NAND log, and when the next one may be written");
   context.addJsonOption(showCommand);

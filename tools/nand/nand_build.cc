@@ -92,7 +92,7 @@ class Builder {
     if (const auto number = wordOf(statistic)) return *number;
     const auto name = statistic.string();
     if (!name) {
-      return Error{format("%s names no statistic: give its name, or its number of at most 32 bits",
+      return Error{format("%s is not a statistic: give its name or its 32-bit number",
                           inlineText(statistic))};
     }
     const auto at = byName_.find(*name);

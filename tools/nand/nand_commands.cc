@@ -49,7 +49,7 @@ std::string nameOf(const std::string& file) {
 // Whether both files are standard input, which can be read only once. Says so.
 bool namesInputTwice(ToolContext& context, const Arguments& arguments) {
   if (arguments.file != "-" || arguments.other != "-") return false;
-  context.failUsage("standard input can be read once: give - for one of the files");
+  context.failUsage("standard input can be read only once: give - for one of the files");
   return true;
 }
 
@@ -104,8 +104,8 @@ void parse(ToolContext& context, const Arguments& arguments) {
   if (context.json()) return printStatisticsJson(context.out(), result, statistics, buffer);
   if (const auto unlisted = printStatistics(context.page(), statistics, buffer); unlisted > 0) {
     context.note(
-        format("%s: %s not wholly listed: of unknown statistics, without values or with too many: "
-               "--json prints them whole",
+        format("%s: %s not listed in full: of unknown statistics, without values or with too many: "
+               "--json prints them in full",
                nameOf(arguments.file), counted(unlisted, "record")));
   }
 }
@@ -266,7 +266,7 @@ void addNandCommands(Command app, ToolContext& context) {
   addFile(snapshotCommand, "Snapshot records; - is standard input").required();
   snapshotCommand
       .addOption("--descriptor", arguments->other,
-                 "What describes the records (default: the fixed layout)")
+                 "The descriptor of the records (default: the fixed layout)")
       .typeName("FILE");
   snapshotCommand.onRun([&context, arguments] { snapshot(context, *arguments); });
 

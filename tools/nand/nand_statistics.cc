@@ -152,7 +152,7 @@ std::size_t printStatistics(const Page& page, const ASPContext& context, ByteSpa
     table.add({std::string(name), std::string(asText(entry.text))});
   });
   if (table.empty()) {
-    page.out << "no statistics that have a name\n";
+    page.out << "no named statistics\n";
   } else {
     table.print(page);
   }
@@ -218,7 +218,7 @@ void printDifferences(const Page& page, const std::vector<StatisticDifference>& 
                valueText(difference.after), changeText(difference)});
   }
   if (table.empty()) {
-    page.out << "no differences among the statistics that have a name\n";
+    page.out << "no differences among named statistics\n";
   } else {
     table.print(page);
   }

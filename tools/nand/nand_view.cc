@@ -181,10 +181,10 @@ class View {
     if (key == "ExportVersion" && number(key)) return format("%#llx", *number(key));
     if (key == "formatDaysSince2000" && number(key)) {
       if (!derived_.formattedFrom) return "weeks";
-      return format("weeks: formatted in the week from %s on", dateText(*derived_.formattedFrom));
+      return format("weeks: formatted in the week of %s", dateText(*derived_.formattedFrom));
     }
     if (key == "NumVirtualBlocks" && derived_.capacityBytes) {
-      return format("of %s, %s in all", size(derived_.virtualBlockBytes),
+      return format("of %s, %s in total", size(derived_.virtualBlockBytes),
                     size(derived_.capacityBytes));
     }
     if (const auto share = freeShare(key)) return percentText(*share);

@@ -215,12 +215,12 @@ class OverlayCrashReporting final : public CrashReporting {
     plist::Array names = plist::Array::create();
     for (const std::string& name : below_.oldRecordFiles())
       names.append(name);
-    events_.tell(OverlayEvent::Kind::CleanUp, "files of old structured records", names);
+    events_.tell(OverlayEvent::Kind::CleanUp, "old files of structured records", names);
   }
   void rollNorvaneCareLogs() override {
     events_.tell(OverlayEvent::Kind::RollOver,
                  below_.hasSupportLog() ? "the support log"
-                                        : "nothing: the support log is empty or not there");
+                                        : "nothing: the support log is empty or missing");
   }
   std::string systemIdentifier() override {
     return told("system identifier", below_.systemIdentifier());

@@ -85,7 +85,7 @@ Expected<StructuredRecord> parseRecord(std::string_view line) {
   const auto type = object.number("type");
   const plist::Dictionary content = object.dictionary("record");
   if (!time || !type || !content) {
-    return Error{"no object with \"time\", \"type\" and \"record\""};
+    return Error{"not an object with \"time\", \"type\" and \"record\""};
   }
   return StructuredRecord{std::string(*time), *type, content};
 }

@@ -226,11 +226,11 @@ Expected<Selection> selectionOf(ToolContext& context, const Arguments& arguments
 void addSelectionOptions(Command command, Arguments& arguments) {
   command
       .addOption("--type", arguments.type,
-                 "Only those of one type: 172 for ECC events, 176 for telemetry and defects")
+                 "Only records of this type: 172 for ECC events, 176 for telemetry and defects")
       .typeName("N");
   command
       .addOption("--day", arguments.day,
-                 "Only those of one day: today, yesterday, a day number or YYYY-MM-DD, UTC")
+                 "Only records of this day: today, yesterday, a day number or YYYY-MM-DD, UTC")
       .typeName("DAY");
 }
 
@@ -252,8 +252,9 @@ void addRecordsCommands(Command app, ToolContext& context) {
 
   const Command showCommand = group.addCommand("show", "Show records, oldest day first");
   addSelectionOptions(showCommand, *arguments);
-  showCommand.addFlag("-f,--follow", arguments->follow,
-                      "Go on with new records until SIGINT or SIGTERM; with --json one a line");
+  showCommand.addFlag(
+      "-f,--follow", arguments->follow,
+      "Keep printing new records until SIGINT or SIGTERM; with --json one per line");
   context.addJsonOption(showCommand);
   showCommand.onRun([&context, arguments] {
     const auto selection = selectionOf(context, *arguments);

@@ -12,6 +12,7 @@
 #include "tools/rehearsal/rehearsal.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_value.h"
+#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
@@ -72,9 +73,8 @@ bool isRead(Kind kind) {
 
 std::string submissionText(const OverlayEvent& event) {
   const plist::Dictionary log = event.value.dictionary();
-  std::string text =
-      format("%s, type %s, %s", event.subject, *log.string("type"),
-             counted(static_cast<std::uint64_t>(log.number("bytes")->int64()), "byte"));
+  std::string text = format("%s, type %s, %s", event.subject, *log.string("type"),
+                            sizeText(log.number("bytes")->real()));
   if (const auto options = log.dictionary("options")) {
     text += format(", options %s", inlineText(options));
   }
@@ -84,8 +84,8 @@ std::string submissionText(const OverlayEvent& event) {
 std::string valueText(const plist::Value& value, Shows shows) {
   if (!value || (value.array() && value.array().empty())) return "none";
   if (const auto number = value.number(); number && shows >= Shows::Bytes) {
-    return counted(static_cast<std::uint64_t>(number->int64()),
-                   shows == Shows::Bytes ? "byte" : "row");
+    return shows == Shows::Bytes ? sizeText(number->real())
+                                 : counted(static_cast<std::uint64_t>(number->int64()), "row");
   }
   const auto text = value.string();
   if (text && shows != Shows::Value) return std::string(*text);
@@ -221,12 +221,12 @@ void print(ToolContext& context, const Rehearsal& rehearsal, RehearsedRun run, b
   for (const RehearsedStep& step : rehearsal.steps)
     printStep(out, step, verbose);
   const Totals totals = totalsOf(rehearsal);
-  out << "\nIn all it would write: " << summaryOf(totals) << '\n';
-  if (!verbose && !totals.empty()) out << "--verbose shows everything, and what logs hold.\n";
+  out << "\nIn total it would write: " << summaryOf(totals) << '\n';
+  if (!verbose && !totals.empty()) out << "--verbose shows everything, with the content of logs.\n";
   out << format("It would file %s\n",
                 rehearsal.logOutcome
                     ? logOutcomeText(*rehearsal.logOutcome, dayText(rehearsal.day))
-                    : format("no log: the run for day %s is done", dayText(rehearsal.day)));
+                    : format("no log: the run for day %s is already done", dayText(rehearsal.day)));
 }
 
 Json documentOf(const Rehearsal& rehearsal, RehearsedRun run) {
@@ -262,7 +262,7 @@ struct Arguments {
 
 void addRehearseCommand(Command app, ToolContext& context) {
   const Command command = app.addCommand(
-      "rehearse", "Play a daily run and tell what it reads and would write; changes nothing");
+      "rehearse", "Show what a daily run would read and write, without changing anything");
   const auto arguments = std::make_shared<Arguments>();
   const Option forced = command.addFlag("--forced", arguments->forced,
                                         "The daily tasks for yesterday, done or not (tavrel -f)");

@@ -40,7 +40,8 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
   if (noting.hasErrors()) context.setExitStatus(kExitFailure);
   // For a driver whose channels cannot be read, the notes have only the library's words.
   if (channels && noting.hasPrinted()) {
-    context.note("such drivers are left out: 'tavrelctl registry show ID' shows what they publish");
+    context.note(
+        "these drivers are left out: 'tavrelctl registry show ID' shows what they publish");
   }
   return channels;
 }
@@ -139,7 +140,7 @@ class Changes {
     delta.samples = IOReportCreateSamplesDelta(previous, current, nullptr);
     if (!delta.samples) delta = subtractEach(previous, current);
     if (delta.leftOut != std::exchange(leftOut_, delta.leftOut) && delta.leftOut > 0) {
-      context_.note(format("%s without a change that can be told, left out; the first is %s",
+      context_.note(format("%s left out, as the change is unknown; the first is %s",
                            counted(delta.leftOut, "channel"), delta.firstLeftOut));
     }
     return delta.samples;
@@ -241,7 +242,7 @@ void addReportCommands(Command app, ToolContext& context) {
 
   const Command listed = addCommand(group, "list", "List channels by driver, group and subgroup",
                                     arguments, context, list);
-  listed.addFlag("--flat", arguments->flat, "A table, one line a channel");
+  listed.addFlag("--flat", arguments->flat, "A table, one line per channel");
   context.addJsonOption(listed);
 
   const Command sampled =

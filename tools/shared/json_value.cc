@@ -64,7 +64,7 @@ Expected<plist::Value> valueOfSpecial(std::string_view member, std::string_view 
   for (const double value : {HUGE_VAL, -HUGE_VAL, std::nan("")}) {
     if (text == numberText(value)) return plist::Value(value);
   }
-  return Error{"\"$real\" is none of \"nan\", \"inf\", \"-inf\""};
+  return Error{"\"$real\" is not one of \"nan\", \"inf\", \"-inf\""};
 }
 
 bool isSpecial(std::string_view key) {
@@ -78,7 +78,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   plist::Value takeResult() { return std::move(result_); }
   const std::string& message() const { return message_; }
 
-  bool null() override { return fail("null has no place in a property list"); }
+  bool null() override { return fail("a property list cannot contain null"); }
   bool boolean(bool value) override { return add(value); }
   bool number_integer(number_integer_t value) override { return add(value); }
   bool number_unsigned(number_unsigned_t value) override {

@@ -240,7 +240,7 @@ void findHiddenPrefixes(WhitelistTable table, const std::vector<WhitelistRule>& 
       enclosing.pop_back();  // a rival in another group, which has its finding
     } else if (!enclosing.empty()) {
       findings.add(pathOf(table, *enclosing.back()),
-                   format("is hidden by the longer prefix %s for the keys that begin so",
+                   format("is hidden by the longer prefix %s for keys that begin with that",
                           pathOf(table, *rule)));
     }
     enclosing.push_back(rule);

@@ -93,14 +93,14 @@ void addWhitelistCommands(Command app, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
 
   const Command checkCommand = group.addCommand(
-      "check", "Point at what the daemon would ignore; exit status 1 when there is any");
+      "check", "Report what the daemon would ignore; exit status 1 if there is anything");
   checkCommand.addOption("FILE", arguments->file,
                          "Whitelist (default: the device's own); - is standard input");
   context.addJsonOption(checkCommand);
   checkCommand.onRun([&context, arguments] { check(context, *arguments); });
 
   const Command explainCommand =
-      group.addCommand("explain", "Show which rule decides on a key, and with which options");
+      group.addCommand("explain", "Show which rule decides about a key, and its options");
   explainCommand.addOption("KEY", arguments->keys, "Statistics keys").required();
   explainCommand.addOption("--value", arguments->value, "Also show how this value is coarsened")
       .typeName("N");

@@ -277,8 +277,9 @@ Status FileSystem::lock(int descriptor, const std::string& path) {
     if (errno == EINTR) continue;
     if (errno != EWOULDBLOCK) return systemError("lock", path);
     if (monotonicMilliseconds() > end) {
-      return Error{"cannot lock " + path + ": another process has held it for " +
-                   std::to_string(limits::kFileLockMilliseconds / 1000) + " seconds; end it"};
+      return Error{"cannot lock " + path + ": another process has had it locked for " +
+                   std::to_string(limits::kFileLockMilliseconds / 1000) +
+                   " seconds; end that process"};
     }
     constexpr timespec kPause{0, 2'000'000};
     nanosleep(&kPause, nullptr);

@@ -80,7 +80,7 @@ bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::str
                                               const LogWriter& writer) {
   const Status filed = fileLog(logType, logName, options, writer);
   if (!filed) {
-    log_.log(LogLevel::Error, "log \"%s\" is not filed: %s", plainLogName(logName),
+    log_.log(LogLevel::Error, "cannot file log \"%s\": %s", plainLogName(logName),
              filed.error().message);
   }
   return static_cast<bool>(filed);
@@ -158,7 +158,8 @@ void FileSubmission::submitDiagnosticLogs() {
       continue;
     }
     if (Status moved = moveToOutbox(name); !moved) {
-      log_.log(LogLevel::Error, "log \"%s\" is not sent on: %s", name, moved.error().message);
+      log_.log(LogLevel::Error, "cannot move log \"%s\" to the outbox: %s", name,
+               moved.error().message);
     }
   }
 }

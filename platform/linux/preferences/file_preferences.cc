@@ -62,8 +62,8 @@ void FilePreferences::ZTXPreferencesSetValue(std::string_view key, const plist::
                                              std::string_view domain) {
   if (!isValidDomain(domain)) {
     log_.log(LogLevel::Error,
-             "cannot set preference %s: %s is not the name of a domain; use 1 to %d characters "
-             "without slash, control character or a dot in front",
+             "cannot set preference %s: %s is not the name of a domain; use 1 to %d characters, "
+             "no slash or control character, and no dot in front",
              quoted(key.substr(0, limits::kPreferenceDomainBytes)),
              quoted(domain.substr(0, limits::kPreferenceDomainBytes)),
              static_cast<int>(limits::kPreferenceDomainBytes));
@@ -174,7 +174,7 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   if (!bytes) return Error{"cannot write preferences " + path + ": " + bytes.error().message};
   if (bytes->size() > limits::kPreferenceFileBytes) {
     return Error{"cannot write preferences " + path + ": they need " +
-                 std::to_string(bytes->size()) + " bytes and may have " +
+                 std::to_string(bytes->size()) + " bytes, and the limit is " +
                  std::to_string(limits::kPreferenceFileBytes) + "; remove some"};
   }
   // Equal bytes spare the flash, unless an earlier attempt may have failed to make them durable.
@@ -208,7 +208,7 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
     if (!alone) {
       unfit[key] = alone.error().message;
     } else if (alone->size() > kLargestChange) {
-      unfit[key] = format("it needs %llu bytes and may have %llu", std::uint64_t{alone->size()},
+      unfit[key] = format("it needs %llu bytes; the limit is %llu", std::uint64_t{alone->size()},
                           std::uint64_t{kLargestChange});
     } else {
       changes.emplace_back(alone->size(), key);
@@ -221,7 +221,7 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
   std::sort(changes.begin(), changes.end());
   while (bytes && bytes->size() > limits::kPreferenceFileBytes && !changes.empty()) {
     const std::string why =
-        format("with it the file would have %llu bytes and may have %llu",
+        format("the file would have %llu bytes with it; the limit is %llu",
                std::uint64_t{bytes->size()}, std::uint64_t{limits::kPreferenceFileBytes});
     // Encoding again after each of many small changes would take for ever.
     std::size_t excess = bytes->size() - limits::kPreferenceFileBytes;
@@ -240,7 +240,7 @@ Status FilePreferences::setAside(const std::string& path, std::string_view fault
   const std::string aside =
       path + ".corrupt-" + compactStamp(clock_.now()) + "-" + randomName().substr(0, 4);
   if (Status moved = files_.rename(path, aside); !moved) return moved;
-  log_.log(LogLevel::Error, "preferences %s could not be read (%s): kept as %s; a new file begins",
+  log_.log(LogLevel::Error, "preferences %s could not be read (%s): moved to %s; a new file begins",
            path, fault, aside);
   return Done{};
 }

@@ -56,11 +56,12 @@ const char* HubChannels::addOne(const plist::Dictionary& channel) {
   bool isWhole = isGroup(elements);
   if (groups) isWhole = !groups.empty() && std::all_of(groups.begin(), groups.end(), isGroup);
   if (!isWhole) {
-    return "its \"Elements\" are not groups of it; give elements of 64 bytes with its ids, the "
+    return "its \"Elements\" are not groups of this channel; give elements of 64 bytes with its "
+           "ids, the "
            "first with their number at offset 20";
   }
   if (!channels_.emplace(Key{*driverID, *channelID}, HubChannel(elements)).second) {
-    return "an earlier one has its ids; give each channel of a driver its own";
+    return "an earlier channel has the same ids; give each channel of a driver its own";
   }
   return nullptr;
 }

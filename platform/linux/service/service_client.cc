@@ -20,10 +20,10 @@ std::string_view advice(int code) {
   switch (code) {
     case ENOENT:
     case ECONNREFUSED:
-      return "; is the service started?";
+      return "; start tavrel or its socket unit";
     case EACCES:
     case EPERM:
-      return "; only root and the service's own user may";
+      return "; only root and the service's own user may connect";
     default:
       return "";
   }

@@ -116,7 +116,7 @@ Status sendPacket(int socket, ByteSpan content, const Descriptor& file) {
     sent = sendmsg(socket, &header, MSG_NOSIGNAL);
   } while (sent < 0 && errno == EINTR);
   if (sent >= 0) return Done{};
-  if (errno == EAGAIN) return Error{"cannot send the message: the service does not take it"};
+  if (errno == EAGAIN) return Error{"cannot send the message: the service is not reading"};
   return systemFailure("cannot send the message");
 }
 

@@ -92,7 +92,7 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
   }
   if (chosen < 0 || (!byName && fitting > 1)) {
     log.log(LogLevel::Error,
-            "none of the %d sockets of LISTEN_FDS can be told to be %s: set FileDescriptorName=%s "
+            "none of the %d sockets of LISTEN_FDS is known to be %s: set FileDescriptorName=%s "
             "in the socket unit",
             *count, name, name);
     return {};

@@ -6,7 +6,7 @@
 namespace tavrel {
 
 RefusalLog::~RefusalLog() {
-  runGuarded(log_, "tell what was not logged", [this] { sayLeftOut(); });
+  runGuarded(log_, "log how many refusals were left out", [this] { sayLeftOut(); });
 }
 
 void RefusalLog::sayLeftOut() {
