@@ -220,22 +220,22 @@ void XmlReader::fail(std::string_view reason) {
 void XmlReader::startElement(std::string_view name) {
   const Element element = elementNamed(name);
   if (scalar_ != Element::None) {
-    return fail("<" + excerpt(name) + "> stands where only text may");
+    return fail("<" + excerpt(name) + "> found where only text may be");
   }
   if (element == Element::None) {
-    return fail("<" + excerpt(name) + "> is no element of property lists");
+    return fail("<" + excerpt(name) + "> is not an element of property lists");
   }
   if ((element == Element::Plist) == insidePlist_) {
     return fail(insidePlist_ ? "<plist> is inside another <plist>"
-                             : "<" + excerpt(name) + "> stands where <plist> should");
+                             : "<" + excerpt(name) + "> found where <plist> should be");
   }
   if (element == Element::Plist) {
     insidePlist_ = true;
   } else if (element == Element::Key) {
     if (containers_.empty() || containers_.back().element != Element::Dict) {
-      return fail("<key> stands outside <dict>");
+      return fail("<key> found outside <dict>");
     }
-    if (containers_.back().hasKey) return fail("<key> stands where the value of a key should");
+    if (containers_.back().hasKey) return fail("<key> found where the value of a key should be");
     scalar_ = Element::Key;
     text_.clear();
   } else {
@@ -247,7 +247,7 @@ void XmlReader::startValue(Element element, std::string_view name) {
   if (containers_.empty()) {
     if (!root_.isNull()) return fail("<" + excerpt(name) + "> is a second value");
   } else if (containers_.back().element == Element::Dict && !containers_.back().hasKey) {
-    return fail("<" + excerpt(name) + "> stands where <key> should");
+    return fail("<" + excerpt(name) + "> found where <key> should be");
   }
   if (++values_ > limits::kPropertyListValues) {
     return fail(format("there are more than %zu values", limits::kPropertyListValues));
@@ -337,7 +337,7 @@ void XmlReader::characters(std::string_view text) {
   if (scalar_ >= Element::Key && scalar_ <= Element::Data) {
     text_.append(text);
   } else if (!std::ranges::all_of(text, isSpace)) {
-    fail("text stands outside an element that holds text");
+    fail("text found outside an element that contains text");
   }
 }
 

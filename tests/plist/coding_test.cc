@@ -16,7 +16,7 @@ TEST(Coding, RecognisesTheEncodingByContent) {
     EXPECT_EQ(*coding.decode(asBytes(bytes)), value);
   EXPECT_EQ(coding.decode({}).error().message, "not a property list: the document is empty");
   EXPECT_EQ(coding.decode(asBytes(" \n<html/>")).error().message,
-            "XML property list, line 2, column 1: <html> is no element of property lists");
+            "XML property list, line 2, column 1: <html> is not an element of property lists");
 }
 
 }  // namespace

@@ -140,11 +140,12 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
   const std::pair<std::string, std::string> rows[] = {
       {"", "1: <plist> contains no value"},
       {"<true/><true/>", "8: <true> is a second value"},
-      {"<key>a</key>", "1: <key> stands outside <dict>"},
+      {"<key>a</key>", "1: <key> found outside <dict>"},
       {"<dict><key>a</key></dict>", "19: the last <key> of a <dict> has no value"},
-      {"<dict><key>a</key><key>b</key></dict>", "19: <key> stands where the value of a key should"},
-      {"<string>a<true/></string>", "10: <true> stands where only text may"},
-      {"<array>x</array>", "8: text stands outside an element that holds text"},
+      {"<dict><key>a</key><key>b</key></dict>",
+       "19: <key> found where the value of a key should be"},
+      {"<string>a<true/></string>", "10: <true> found where only text may be"},
+      {"<array>x</array>", "8: text found outside an element that contains text"},
       {"<integer>--1</integer>", "13: \"--1\" is not a 64-bit integer"},
       {"<integer>" + std::string(59, '9') + "\xC3\xA9</integer>",
        "70: \"" + std::string(59, '9') + "...\" is not a 64-bit integer"},
@@ -159,7 +160,7 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
   EXPECT_EQ(errorOf(wrapped("<integer>\n1\t\"2\"</integer>")),
             "XML property list, line 4, column 6: \"\\n1\\t\\\"2\\\"\" is not a 64-bit integer");
   EXPECT_EQ(errorOf("<dict/>"),
-            "XML property list, line 1, column 1: <dict> stands where <plist> should");
+            "XML property list, line 1, column 1: <dict> found where <plist> should be");
   EXPECT_EQ(errorOf("<!DOCTYPE p [<!ENTITY a \"b\">]><plist><string>&a;</string></plist>"),
             "XML property list, line 1, column 25: entity \"a\" is declared; a property list may "
             "declare none");

@@ -62,8 +62,8 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
   const auto count = numberFromEnvironment("LISTEN_FDS");
   if (!process || *process != getpid() || !count) return {};
   if (*count > limits::kActivationDescriptors) {
-    log.log(LogLevel::Error, "LISTEN_FDS hands over %d sockets, the limit is %d: none is used",
-            *count, limits::kActivationDescriptors);
+    log.log(LogLevel::Error, "LISTEN_FDS passes %d sockets; the limit is %d: none is used", *count,
+            limits::kActivationDescriptors);
     return {};
   }
 
