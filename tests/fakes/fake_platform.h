@@ -173,8 +173,8 @@ struct FakeAnswers : DeviceAnswers {
 struct FakeDigest : Digest {
   std::array<std::byte, 16> md5(ByteSpan) override {
     std::array<std::byte, 16> digest{};
-    for (unsigned char i = 0; i < digest.size(); ++i)
-      digest[i] = std::byte{i};
+    for (std::size_t i = 0; i < digest.size(); ++i)
+      digest[i] = static_cast<std::byte>(i);
     return digest;
   }
 };
