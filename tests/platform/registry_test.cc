@@ -313,7 +313,7 @@ TEST_F(RegistryTest, TheHubFillsTheBufferInOrderOfInterest) {
   auto registry = std::make_unique<RecordedRegistry>(exampleHub(), log);
   Client client(*registry);
   ASSERT_EQ(client.subscribe(interests(5, {{2, 10}, {5, 5}, {1, 11}, {2, 10}, {1, 10}})), 0U);
-  EXPECT_EQ(client.memory->bytes().size(), std::size_t{64 * 6});
+  EXPECT_EQ(client.memory->bytes().size(), 64U * 6);
   const std::string rest = "0/8000000000000000";
   const Lines updates{"2/a*1=300 1/b*3=200 2/a*1=300 1/a*1=100 ",
                       "2/a*1=301 1/b*1=201 2/a*1=301 1/a*1=100 " + rest + "*2=0 ",
