@@ -184,6 +184,46 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
   return Done{};
 }
 
+Expected<std::optional<std::string>> SqliteBatch::segmentPosition(std::uint32_t owner,
+                                                                  SegmentIdentity identity) {
+  try {
+    begin();
+    return segment_table::position(connection_, owner, identity);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
+  try {
+    begin();
+    return segment_table::names(connection_);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity identity,
+                                       std::string_view position) {
+  try {
+    begin();
+    segment_table::setPosition(connection_, owner, identity, position);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity identity) {
+  try {
+    begin();
+    segment_table::removePosition(connection_, owner, identity);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
 SqliteBatch::PendingSeries& SqliteBatch::pendingSeries(const SeriesName& name) {
   if (last_ && last_->first == name) return *last_->second;
   auto found = pending_.find(name);
