@@ -145,8 +145,9 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::Read:
-      // A user who may write uses the log like a writer, and so leaves no log behind. SQLite opens
-      // a write-protected file for reading.
+    case Access::Alone:
+      // A user who may write can use a log that has no index. SQLite opens a write-protected file
+      // for reading.
       flags |= SQLITE_OPEN_READWRITE;
       break;
     case Access::Immutable:
@@ -164,7 +165,10 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
     sqlite().db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
-    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512");
+    if (access == Access::Alone) execute("PRAGMA locking_mode = EXCLUSIVE");
+    // Closing leaves the log: moving it each time would write every page twice for one commit.
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512; PRAGMA secure_delete = FAST");
   } catch (...) {
     sqlite().close_v2(handle_);
     throw;
@@ -195,6 +199,11 @@ void SqliteConnection::execute(const char* sql) {
 std::int64_t SqliteConnection::integer(std::string_view sql) {
   SqliteStatement statement(*this, sql);
   return statement.step() ? statement.integer(0) : 0;
+}
+
+void SqliteConnection::limitLog(std::int64_t bytes) {
+  const std::int64_t pageBytes = std::max<std::int64_t>(integer("PRAGMA page_size"), 512);
+  execute(("PRAGMA wal_autocheckpoint = " + std::to_string(bytes / pageBytes)).c_str());
 }
 
 bool SqliteConnection::checkpoint() {

@@ -63,6 +63,7 @@ class SqliteConnection {
   enum class Access : std::uint8_t {
     Create,     // read and write; an absent file is created
     Read,       // read; uses the write-ahead log as far as the user may
+    Alone,      // read; keeps all others out, and needs no file for the log's index
     Immutable,  // read a file that no process writes, without locks or a log
   };
 
@@ -76,6 +77,9 @@ class SqliteConnection {
 
   /// The first column of the first row.
   std::int64_t integer(std::string_view sql);
+
+  /// From here on a commit that makes the write-ahead log longer also moves it into the database.
+  void limitLog(std::int64_t bytes);
 
   /// Moves the write-ahead log into the database and empties it. False when other processes
   /// prevented part of that; as much as possible has then been moved.

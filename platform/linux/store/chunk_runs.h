@@ -1,0 +1,45 @@
+// Where the values of a distribution are: runs of consecutive rows in the table `chunks`.
+//
+// A distribution's row holds its runs in the order of recording. A run is three numbers, each as
+// seven bits a byte from the lowest on, the top bit set in all bytes but the last: its first chunk,
+// how many chunks it has, and how many values they hold.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+namespace tavrel {
+
+struct ChunkRun {
+  std::int64_t first = 0;
+  std::int64_t chunks = 0;
+  std::int64_t values = 0;
+  bool operator==(const ChunkRun&) const = default;
+};
+
+/// The most values that a distribution holds in a day.
+inline constexpr std::int64_t kValuesPerDistribution = std::int64_t{1} << 30;
+
+void appendRun(std::string& packed, const ChunkRun& run);
+
+/// Nothing when the bytes are no runs, or when one refers to chunks that cannot exist.
+std::optional<std::vector<ChunkRun>> unpackRuns(std::string_view packed);
+
+/// The values of all runs; nothing when there are more than a distribution may hold.
+std::optional<std::int64_t> valuesIn(std::span<const ChunkRun> runs);
+
+/// The place of the first run that should be joined with all behind it, so that many small commits
+/// do not leave a distribution in pieces; `runs.size()` when none should. Only runs of less than
+/// 1,024 values are joined, 64 at most, and while commits are of one size each value twice.
+std::size_t firstToJoin(std::span<const ChunkRun> runs);
+
+/// In version 1 of the schema a distribution had a series: chunks numbered from `series * 1048576`
+/// upward, with 1024 values in each but the last. Nothing when no such series can exist.
+std::optional<ChunkRun> runOfSeries(std::int64_t series, std::int64_t values);
+
+}  // namespace tavrel
