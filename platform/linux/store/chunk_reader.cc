@@ -1,6 +1,5 @@
 #include "platform/linux/store/chunk_reader.h"
 
-#include <string_view>
 #include <utility>
 
 #include "platform/linux/store/sqlite_schema.h"
@@ -8,18 +7,40 @@
 namespace tavrel {
 namespace {
 
-// The columns of store_sql::chunks.
-enum Column : std::uint8_t { kNumber, kOffsetBytes, kData, kOffsets };
+// The value, then the offset.
+constexpr std::size_t kRecordBytes = kPackedValueBytes + kPackedOffsetBytes;
 
 [[noreturn]] void refuse(const std::string& reason) {
   throw StoreFailure{StoreFault::Other, reason + ": restore the file from a copy or move it away"};
 }
 
-[[noreturn]] void refuseForm() {
-  refuse("its values are not in the form that this program writes");
+// How many items of one size there are in a chunk.
+std::size_t countIn(std::string_view data, std::size_t itemBytes) {
+  const std::size_t count = data.size() / itemBytes;
+  if (count == 0 || count > kValuesPerChunk || data.size() != count * itemBytes) {
+    refuse("its values are not in the form that this program writes");
+  }
+  return count;
 }
 
 }  // namespace
+
+std::optional<std::string_view> ChunkReader::Cursor::at(std::int64_t chunk, std::int64_t last) {
+  if (next_ != chunk) {
+    end();
+    if (!rows_) rows_.emplace(connection_, store_sql::kChunks);
+    rows_->bind(1, chunk);
+    rows_->bind(2, last + 1);
+  }
+  next_ = chunk + 1;
+  if (!rows_->step() || rows_->integer(0) != chunk) return std::nullopt;
+  return rows_->bytes(1);
+}
+
+void ChunkReader::Cursor::end() {
+  if (next_) rows_->reset();
+  next_.reset();
+}
 
 void ChunkReader::refuseCount() const {
   refuse("it does not hold the " + std::to_string(count_) + " values that it counts");
@@ -29,66 +50,47 @@ void ChunkReader::begin(std::vector<ChunkRun> runs, std::int64_t count) {
   end();
   runs_ = std::move(runs);
   run_ = 0;
+  chunk_ = 0;
   count_ = count;
   read_ = 0;
   if (count <= 0 || valuesIn(runs_) != count) refuseCount();
 }
 
 void ChunkReader::end() {
-  if (active_) active_->reset();
-  active_ = nullptr;
-}
-
-// True with a row. The statement changes when offsets are wanted only from some chunk on.
-bool ChunkReader::step(bool wantsOffsets) {
-  auto& statement = wantsOffsets ? valuesAndOffsets_ : values_;
-  if (active_ && active_ != &*statement) end();
-  for (; run_ < runs_.size(); ++run_) {
-    ChunkRun& run = runs_[run_];
-    if (!active_) {
-      if (!statement) statement.emplace(connection_, store_sql::chunks(wantsOffsets, version_));
-      active_ = &*statement;
-      active_->bind(1, run.first);
-      active_->bind(2, run.first + run.chunks);
-    }
-    if (active_->step()) {
-      const std::int64_t next = active_->integer(kNumber) + 1;
-      run.chunks -= next - run.first;
-      run.first = next;
-      return true;
-    }
-    end();
-  }
-  return false;
+  values_.end();
+  offsets_.end();
 }
 
 std::optional<DistributionBlock> ChunkReader::next(bool wantsOffsets) {
-  if (!step(wantsOffsets)) {
+  while (run_ < runs_.size() && chunk_ == runs_[run_].chunks) {
+    end();
+    ++run_;
+    chunk_ = 0;
+  }
+  if (run_ == runs_.size()) {
     if (read_ != count_) refuseCount();
     return std::nullopt;
   }
-  const DistributionBlock block = blockAt(wantsOffsets);
-  read_ += static_cast<std::int64_t>(block.values.size() / kPackedValueBytes);
+  const ChunkRun& run = runs_[run_];
+  const std::int64_t chunk = run.first + chunk_++;
+  const auto data = values_.at(chunk, run.first + run.chunks - 1);
+  if (!data) refuseCount();
+  const std::size_t count = countIn(*data, run.holdsRecords ? kRecordBytes : kPackedValueBytes);
+  read_ += static_cast<std::int64_t>(count);
   if (read_ > count_) refuseCount();
-  return block;
+  if (run.holdsRecords) return unpack(*data);
+  if (!wantsOffsets) return DistributionBlock{*data, {}};
+  const auto offsets = offsets_.at(chunk + run.chunks, run.end() - 1);
+  if (!offsets || countIn(*offsets, kPackedOffsetBytes) != count) refuseCount();
+  return DistributionBlock{*data, *offsets};
 }
 
-DistributionBlock ChunkReader::blockAt(bool wantsOffsets) {
-  const std::string_view data = active_->bytes(kData);
-  const bool holdsRecords = active_->isNull(kOffsetBytes);
-  const std::size_t valueBytes = holdsRecords ? kRecordBytes : kPackedValueBytes;
-  const std::size_t count = data.size() / valueBytes;
-  if (count == 0 || data.size() != count * valueBytes || count > kValuesPerChunk) refuseForm();
-  if (!holdsRecords) {
-    const auto offsetBytes = static_cast<std::int64_t>(count * kPackedOffsetBytes);
-    if (active_->integer(kOffsetBytes) != offsetBytes) refuseForm();
-    return {data, wantsOffsets ? active_->bytes(kOffsets) : std::string_view()};
-  }
+DistributionBlock ChunkReader::unpack(std::string_view records) {
   unpackedValues_.clear();
   unpackedOffsets_.clear();
-  for (std::size_t at = 0; at < data.size(); at += kRecordBytes) {
-    unpackedValues_ += data.substr(at, kPackedValueBytes);
-    unpackedOffsets_ += data.substr(at + kPackedValueBytes, kPackedOffsetBytes);
+  for (; !records.empty(); records.remove_prefix(kRecordBytes)) {
+    unpackedValues_ += records.substr(0, kPackedValueBytes);
+    unpackedOffsets_ += records.substr(kPackedValueBytes, kPackedOffsetBytes);
   }
   return {unpackedValues_, unpackedOffsets_};
 }

@@ -1,6 +1,6 @@
 // Reads the values of a distribution, one chunk at a time.
 //
-//   ChunkReader reader(connection, schemaVersion(connection));
+//   ChunkReader reader(connection);
 //   reader.begin(runs, count);
 //   while (const auto block = reader.next(false)) use(block->values);
 #pragma once
@@ -8,6 +8,7 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/distribution_values.h"
@@ -19,9 +20,9 @@ namespace tavrel {
 /// The operations throw a `StoreFailure` that does not name the distribution.
 class ChunkReader {
  public:
-  /// The connection must outlive the reader. `version` is that of the store's schema.
-  ChunkReader(const SqliteConnection& connection, std::int64_t version)
-      : connection_(connection), version_(version) {}
+  /// The connection must outlive the reader.
+  explicit ChunkReader(const SqliteConnection& connection)
+      : values_(connection), offsets_(connection) {}
   ~ChunkReader() { end(); }
   ChunkReader(const ChunkReader&) = delete;
   ChunkReader& operator=(const ChunkReader&) = delete;
@@ -34,19 +35,29 @@ class ChunkReader {
   void end();
 
  private:
-  bool step(bool wantsOffsets);
-  DistributionBlock blockAt(bool wantsOffsets);
+  // Steps through consecutive chunks.
+  class Cursor {
+   public:
+    explicit Cursor(const SqliteConnection& connection) : connection_(connection) {}
+    /// The data of `chunk`, valid until the next call. `last` is the one up to which chunks are
+    /// wanted one after the other. Nothing when there is no such chunk.
+    std::optional<std::string_view> at(std::int64_t chunk, std::int64_t last);
+    void end();
+
+   private:
+    const SqliteConnection& connection_;
+    std::optional<SqliteStatement> rows_;  // made when it is first needed
+    std::optional<std::int64_t> next_;     // the chunk after which the statement stands
+  };
+
+  DistributionBlock unpack(std::string_view records);
   [[noreturn]] void refuseCount() const;
 
-  const SqliteConnection& connection_;
-  std::int64_t version_;
-  // Made when they are first needed.
-  std::optional<SqliteStatement> values_;
-  std::optional<SqliteStatement> valuesAndOffsets_;
-  SqliteStatement* active_ = nullptr;  // the one that is at a row
-
-  std::vector<ChunkRun> runs_;  // what is left of them
-  std::size_t run_ = 0;
+  Cursor values_;
+  Cursor offsets_;
+  std::vector<ChunkRun> runs_;
+  std::size_t run_ = 0;     // the current one of them
+  std::int64_t chunk_ = 0;  // of the current run, the next
   std::int64_t count_ = 0;
   std::int64_t read_ = 0;
   std::string unpackedValues_;

@@ -30,7 +30,7 @@ std::optional<std::int64_t> takeNumber(std::string_view& packed) {
 
 void appendRun(std::string& packed, const ChunkRun& run) {
   appendNumber(packed, run.first);
-  appendNumber(packed, run.chunks);
+  appendNumber(packed, run.chunks * 2 + (run.holdsRecords ? 1 : 0));
   appendNumber(packed, run.values);
 }
 
@@ -44,7 +44,7 @@ std::optional<std::vector<ChunkRun>> unpackRuns(std::string_view packed) {
         *chunks > std::numeric_limits<std::int64_t>::max() - *first) {
       return std::nullopt;
     }
-    runs.push_back({*first, *chunks, *values});
+    runs.push_back({*first, *chunks / 2, *values, *chunks % 2 != 0});
   }
   return runs;
 }
@@ -64,7 +64,7 @@ std::size_t firstToJoin(std::span<const ChunkRun> runs) {
     std::ptrdiff_t count;
   };
   // The second rule leaves room for as many runs as the first lets stand.
-  constexpr Rule kRules[] = {{32, 32}, {1024, 64}};
+  constexpr Rule kRules[] = {{32, 32}, {kValuesPerChunk, 64}};
   std::size_t first = runs.size();
   for (const Rule& rule : kRules) {
     const auto end = std::find_if(runs.rbegin(), runs.rend(), [&rule](const ChunkRun& run) {
@@ -78,10 +78,9 @@ std::size_t firstToJoin(std::span<const ChunkRun> runs) {
 std::optional<ChunkRun> runOfSeries(std::int64_t series, std::int64_t values) {
   constexpr int kOrdinalBits = 20;
   constexpr std::int64_t kSeriesEnd = std::int64_t{1} << (62 - kOrdinalBits);
-  constexpr std::int64_t kValues = 1024;
   if (series < 0 || series >= kSeriesEnd) return std::nullopt;
-  const std::int64_t chunks = values / kValues + (values % kValues != 0 ? 1 : 0);
-  return ChunkRun{series << kOrdinalBits, chunks, values};
+  const std::int64_t chunks = values / kValuesPerChunk + (values % kValuesPerChunk != 0 ? 1 : 0);
+  return ChunkRun{series << kOrdinalBits, chunks, values, true};
 }
 
 }  // namespace tavrel

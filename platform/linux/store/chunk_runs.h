@@ -1,8 +1,12 @@
 // Where the values of a distribution are: runs of consecutive rows in the table `chunks`.
 //
+// A run has its values in so many rows and then, in as many, the offsets of the same values, so
+// that whoever wants the values alone reads no more. A run of version 1 of the schema has rows of
+// records instead, which hold both.
+//
 // A distribution's row holds its runs in the order of recording. A run is three numbers, each as
 // seven bits a byte from the lowest on, the top bit set in all bytes but the last: its first chunk,
-// how many chunks it has, and how many values they hold.
+// twice the count of its chunks (plus one when they hold records), and the count of its values.
 #pragma once
 
 #include <cstddef>
@@ -17,10 +21,16 @@ namespace tavrel {
 
 struct ChunkRun {
   std::int64_t first = 0;
-  std::int64_t chunks = 0;
+  std::int64_t chunks = 0;  // of values or records, without those of offsets
   std::int64_t values = 0;
+  bool holdsRecords = false;
   bool operator==(const ChunkRun&) const = default;
+
+  std::int64_t end() const { return first + (holdsRecords ? chunks : 2 * chunks); }
 };
+
+/// The most values of a chunk.
+inline constexpr std::int64_t kValuesPerChunk = 1024;
 
 /// The most values that a distribution holds in a day.
 inline constexpr std::int64_t kValuesPerDistribution = std::int64_t{1} << 30;

@@ -16,6 +16,9 @@ namespace {
 // their keys: the more there are, the fewer pages are written twice.
 constexpr std::size_t kPendingBytes = 8U << 20;
 
+// A longer log is moved into the database after a commit.
+constexpr off_t kLogBytes = 4 << 20;
+
 // The memory of a waiting distribution, without its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
 
@@ -43,7 +46,7 @@ struct SqliteBatch::Statements {
         setRuns(connection,
                 "INSERT OR REPLACE INTO distributions (day, key, count, runs) "
                 "VALUES (?1, ?2, ?3, ?4)"),
-        addChunk(connection, "INSERT INTO chunks (chunk, data, offsets) VALUES (?1, ?2, ?3)") {}
+        addChunk(connection, "INSERT INTO chunks (chunk, data) VALUES (?1, ?2)") {}
 
   SqliteStatement setScalar;
   SqliteStatement getScalar;
@@ -315,7 +318,7 @@ std::optional<SqliteBatch::PendingSeries> SqliteBatch::takeOut(std::span<const C
   if (runs.empty()) return std::nullopt;
   PendingSeries found;
   try {
-    ChunkReader reader(connection_, kSchemaVersion);
+    ChunkReader reader(connection_);
     reader.begin({runs.begin(), runs.end()}, *valuesIn(runs));
     while (const auto block = reader.next(true)) {
       found.values += block->values;
@@ -328,7 +331,7 @@ std::optional<SqliteBatch::PendingSeries> SqliteBatch::takeOut(std::span<const C
   SqliteStatement remove(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
   for (const ChunkRun& run : runs) {
     remove.bind(1, run.first);
-    remove.bind(2, run.first + run.chunks);
+    remove.bind(2, run.end());
     remove.run();
   }
   return found;
@@ -339,21 +342,10 @@ ChunkRun SqliteBatch::writeRun(const DistributionBlock& block) {
   if (nextChunk_ < 0) {
     nextChunk_ = connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") + 1;
   }
-  const std::size_t count = block.values.size() / kPackedValueBytes;
-  ChunkRun run{nextChunk_, 0, static_cast<std::int64_t>(count)};
-  SqliteStatement& statement = statements_->addChunk;
-  for (std::size_t at = 0; at < count; at += kValuesPerChunk, ++run.chunks) {
-    if (nextChunk_ < 0 || nextChunk_ == std::numeric_limits<std::int64_t>::max()) {
-      throw StoreFailure{StoreFault::Other,
-                         "no number is left for more values: move the file away"};
-    }
-    statement.bind(1, nextChunk_++);
-    statement.bind(
-        2, block.values.substr(at * kPackedValueBytes, kValuesPerChunk * kPackedValueBytes));
-    statement.bind(
-        3, block.offsets.substr(at * kPackedOffsetBytes, kValuesPerChunk * kPackedOffsetBytes));
-    statement.run();
-  }
+  const auto count = static_cast<std::int64_t>(block.values.size() / kPackedValueBytes);
+  const ChunkRun run{nextChunk_, (count + kValuesPerChunk - 1) / kValuesPerChunk, count};
+  addChunks(block.values, kValuesPerChunk * kPackedValueBytes);
+  addChunks(block.offsets, kValuesPerChunk * kPackedOffsetBytes);
   return run;
 }
 
@@ -364,6 +356,31 @@ void SqliteBatch::finish() {
   if (!begun_) return;
   connection_.execute("COMMIT");
   if (takenNumber_) removeTakenValues();
+  limitLog();
+}
+
+void SqliteBatch::addChunks(std::string_view data, std::size_t bytesPerChunk) {
+  SqliteStatement& statement = statements_->addChunk;
+  for (; !data.empty(); data.remove_prefix(std::min(bytesPerChunk, data.size()))) {
+    if (nextChunk_ < 0 || nextChunk_ == std::numeric_limits<std::int64_t>::max()) {
+      throw StoreFailure{StoreFault::Other,
+                         "no number is left for more values: move the file away"};
+    }
+    statement.bind(1, nextChunk_++);
+    statement.bind(2, data.substr(0, bytesPerChunk));
+    statement.run();
+  }
+}
+
+// The changes are kept already, so that the log may stay as it is for now.
+void SqliteBatch::limitLog() {
+  const auto log = FileSystem::status(site_.path + "-wal");
+  if (!log || log->st_size <= kLogBytes) return;
+  try {
+    connection_.checkpoint(false);
+  } catch (const StoreFailure& failure) {
+    site_.tell(failure, "; the write-ahead log stays as it is");
+  }
 }
 
 Status SqliteBatch::commit() {

@@ -97,6 +97,7 @@ class SqliteBatch {
   void begin();
   void takeKeptValues();
   void removeTakenValues();
+  void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
@@ -104,6 +105,7 @@ class SqliteBatch {
   void writeSeries(const SeriesName& name, const DistributionBlock& added);
   std::optional<PendingSeries> takeOut(std::span<const ChunkRun> runs);
   ChunkRun writeRun(const DistributionBlock& block);
+  void addChunks(std::string_view data, std::size_t bytesPerChunk);
   Error describe(const StoreFailure& failure) const;
 
   SqliteConnection connection_;

@@ -201,14 +201,11 @@ std::int64_t SqliteConnection::integer(std::string_view sql) {
   return statement.step() ? statement.integer(0) : 0;
 }
 
-void SqliteConnection::limitLog(std::int64_t bytes) {
-  const std::int64_t pageBytes = std::max<std::int64_t>(integer("PRAGMA page_size"), 512);
-  execute(("PRAGMA wal_autocheckpoint = " + std::to_string(bytes / pageBytes)).c_str());
-}
-
-bool SqliteConnection::checkpoint() {
+bool SqliteConnection::checkpoint(bool waits) {
+  if (!waits) sqlite().busy_handler(handle_, nullptr, nullptr);
   const int code =
       sqlite().wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  if (!waits) sqlite().busy_handler(handle_, waitForLock, busy_.get());
   if (code == SQLITE_OK) return true;
   if ((code & 0xFF) == SQLITE_BUSY || (code & 0xFF) == SQLITE_LOCKED) return false;
   throwFailure(handle_, code);

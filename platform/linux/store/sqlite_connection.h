@@ -78,12 +78,10 @@ class SqliteConnection {
   /// The first column of the first row.
   std::int64_t integer(std::string_view sql);
 
-  /// From here on a commit that makes the write-ahead log longer also moves it into the database.
-  void limitLog(std::int64_t bytes);
-
   /// Moves the write-ahead log into the database and empties it. False when other processes
-  /// prevented part of that; as much as possible has then been moved.
-  bool checkpoint();
+  /// prevented part of that, for as long as is waited for them; as much as possible has then been
+  /// moved.
+  bool checkpoint(bool waits = true);
 
   sqlite3* handle() const { return handle_; }
 

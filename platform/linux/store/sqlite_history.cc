@@ -249,7 +249,7 @@ Status SqliteHistory::walkDistribution(std::string_view key, std::int32_t firstD
                                        std::int32_t lastDay, const CountedRowHandler& rowHandler) {
   return attemptTellingAtEnd([&](const FailureHandler& tell) {
     SqliteStatement next(store_->connection, store_sql::distributions(store_sql::kNext, version_));
-    ChunkReader reader(store_->connection, version_);
+    ChunkReader reader(store_->connection);
     eachDayOf(next, key, firstDay, lastDay,
               [&](bool& stop) { readRow(next, reader, rowHandler, tell, stop); });
   });
@@ -309,7 +309,7 @@ void SqliteHistory::readDistributions(const Selection& selection,
                                       const FailureHandler& tell) {
   if (selection.isEmpty()) return;
   SqliteStatement rows(store_->connection, store_sql::distributions(selection.rows(), version_));
-  ChunkReader reader(store_->connection, version_);
+  ChunkReader reader(store_->connection);
   selection.bind(rows);
   bool stop = false;
   while (!stop && rows.step()) {

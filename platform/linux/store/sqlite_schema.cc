@@ -17,9 +17,6 @@ namespace {
 // For a new store, whatever the library was built with. A commit writes whole pages.
 constexpr const char* kPageSize = "PRAGMA page_size = 4096";
 
-// The log is moved into the database when it is longer.
-constexpr std::int64_t kLogBytes = 4 << 20;
-
 // Keys are blobs: they are compared byte by byte and may hold any byte.
 constexpr const char* kScalarsTable = R"(
 CREATE TABLE scalars (
@@ -39,8 +36,7 @@ CREATE TABLE distributions (
 constexpr const char* kChunksTable = R"(
 CREATE TABLE chunks (
   chunk INTEGER PRIMARY KEY,
-  data BLOB NOT NULL,
-  offsets BLOB
+  data BLOB NOT NULL
 ) STRICT)";
 constexpr const char* kSegmentsTable = R"(
 CREATE TABLE IF NOT EXISTS segments (
@@ -113,12 +109,6 @@ std::string store_sql::distributions(std::string_view rows, std::int64_t version
   return ("SELECT key, day, count, " + place + " FROM distributions ").append(rows);
 }
 
-std::string store_sql::chunks(bool wantsOffsets, std::int64_t version) {
-  const std::string offsets = version == 1 ? "NULL" : "offsets";
-  return "SELECT chunk, length(" + offsets + "), data" + (wantsOffsets ? ", " + offsets : "") +
-         " FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
-}
-
 std::int64_t schemaVersion(SqliteConnection& connection) {
   return connection.integer("PRAGMA user_version");
 }
@@ -146,7 +136,7 @@ void migrate(SqliteConnection& connection) {
       }
     }
     // The chunks stay: only the rows that refer to them are written anew.
-    connection.execute("DROP TABLE series; ALTER TABLE chunks ADD COLUMN offsets BLOB");
+    connection.execute("DROP TABLE series");
     connection.execute(kSegmentsTable);
     connection.execute(kSetVersion);
     connection.execute("COMMIT");
@@ -185,7 +175,9 @@ SqliteConnection openStoreForWriting(const std::string& path,
   if (!isKnown(version)) refuseSchema(version);
   // Each commit is flushed: what was reported as kept also survives a power cut.
   connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
-  connection.limitLog(kLogBytes);
+  // SQLite's own checkpoint leaves the log's content there. The next process to open the store
+  // would not know that it has been moved, and would move it again.
+  connection.execute("PRAGMA wal_autocheckpoint = 0");
   return connection;
 }
 

@@ -2,7 +2,7 @@
 // the tables for users of other tools.
 #pragma once
 
-#include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -41,18 +41,11 @@ std::string scalars(std::string_view rows);
 /// (chunk_runs.h), or a series in version 1.
 std::string distributions(std::string_view rows, std::int64_t version);
 
-/// ?1 first chunk, ?2 chunk behind the last: the chunk's number, the bytes of its offsets or null,
-/// its data and, when they are wanted, its offsets.
-std::string chunks(bool wantsOffsets, std::int64_t version);
+/// ?1 first chunk, ?2 chunk behind the last.
+inline constexpr std::string_view kChunks =
+    "SELECT chunk, data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
 
 }  // namespace store_sql
-
-/// The most values of a chunk. While values are read, those of one chunk are in memory.
-inline constexpr std::size_t kValuesPerChunk = 1024;
-
-/// A chunk of version 1, which is left as it is, has no offsets of its own: its data are records of
-/// the value and the offset.
-inline constexpr std::size_t kRecordBytes = 12;
 
 /// The version of the store's schema; 0 for an empty file.
 std::int64_t schemaVersion(SqliteConnection& connection);
