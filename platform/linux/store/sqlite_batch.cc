@@ -177,24 +177,25 @@ Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64
 
 Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
                                 std::uint32_t secondsInDayOffset, double value) {
-  try {
-    PendingSeries& series = pendingSeries({day, key});
-    appendPackedValue(series.values, value);
-    appendPackedOffset(series.offsets, secondsInDayOffset);
-    pendingBytes_ += kPackedValueBytes + kPackedOffsetBytes;
-    if (pendingBytes_ >= kPendingBytes) writeDistributions();
-  } catch (const StoreFailure& failure) {
-    return describe(failure);
-  }
-  return Done{};
+  const DistributionSample sample{value, secondsInDayOffset};
+  return appendValues(day, key, {&sample, 1});
 }
 
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
-  for (const DistributionSample& sample : samples) {
-    if (Status added = appendValue(day, key, sample.secondsInDayOffset, sample.value); !added) {
-      return added;
+  // As many as wait at most, so that a large span is no exception.
+  constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
+  try {
+    while (!samples.empty()) {
+      const auto taken = samples.first(std::min(samples.size(), kPendingBytes / kSampleBytes));
+      PendingSeries& series = pendingSeries({day, key});
+      appendPacked(series.values, series.offsets, taken);
+      pendingBytes_ += taken.size() * kSampleBytes;
+      if (pendingBytes_ >= kPendingBytes) writeDistributions();
+      samples = samples.subspan(taken.size());
     }
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
   }
   return Done{};
 }
