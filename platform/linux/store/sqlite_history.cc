@@ -191,9 +191,9 @@ void SqliteHistory::readUnchanged(Read read) {
       read();
     } catch (const StoreFailure& failure) {
       // A writer may have converted the store since. The query has then not given any row yet.
-      const std::int64_t version = schemaVersion(store_->connection);
-      if (failure.fault != StoreFault::Foreign || version == version_) throw;
-      version_ = version;
+      if (failure.fault != StoreFault::Foreign) throw;
+      const auto before = std::exchange(version_, schemaVersion(store_->connection));
+      if (version_ == before) throw;
       read();
     }
   } catch (const StoreFailure&) {
