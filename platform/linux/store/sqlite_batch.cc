@@ -17,7 +17,7 @@ namespace {
 constexpr std::size_t kPendingBytes = 8U << 20;
 
 // A longer log is moved into the database after a commit.
-constexpr off_t kLogBytes = 4 << 20;
+constexpr off_t kLogBytes = 1 << 20;
 
 // The memory of a waiting distribution, without its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
@@ -384,6 +384,11 @@ void SqliteBatch::addChunks(std::string_view data, std::size_t bytesPerChunk) {
     statement.bind(2, data.substr(0, bytesPerChunk));
     statement.run();
   }
+}
+
+SqliteConnection SqliteBatch::release() {
+  statements_.reset();
+  return std::move(connection_);
 }
 
 // The changes are kept already, so that the log may stay as it is for now.
