@@ -205,10 +205,22 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
 
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
-  for (const DistributionSample& sample : samples) {
-    if (Status added = appendValue(day, key, sample.secondsInDayOffset, sample.value); !added) {
-      return added;
+  try {
+    PendingSeries& series = pendingSeries({day, key});
+    const std::size_t held = series.offsets.size() / kPackedOffsetBytes;
+    series.values.resize((held + samples.size()) * kPackedValueBytes);
+    series.offsets.resize((held + samples.size()) * kPackedOffsetBytes);
+    const MutableByteSpan values = std::as_writable_bytes(std::span(series.values));
+    const MutableByteSpan offsets = std::as_writable_bytes(std::span(series.offsets));
+    for (std::size_t i = 0; i < samples.size(); ++i) {
+      storeLittle64(values, (held + i) * kPackedValueBytes,
+                    std::bit_cast<std::uint64_t>(samples[i].value));
+      storeLittle32(offsets, (held + i) * kPackedOffsetBytes, samples[i].secondsInDayOffset);
     }
+    pendingBytes_ += samples.size() * (kPackedValueBytes + kPackedOffsetBytes);
+    if (pendingBytes_ >= kPendingBytes) writeDistributions();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
   }
   return Done{};
 }
