@@ -45,6 +45,8 @@ class SqliteBatch {
   /// Adds to the day's value, which is 0 when absent. A sum outside of 64 bits is refused and
   /// leaves the value as it was.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t amount);
+  /// The day's value as this batch leaves it; nothing when there is none.
+  Expected<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key);
   Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
                      double value);
   Status appendValues(std::int32_t day, std::string_view key,
@@ -102,6 +104,7 @@ class SqliteBatch {
   void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
+  std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
   void writeSeries(const SeriesName& name, const DistributionBlock& added);
