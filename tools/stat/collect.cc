@@ -26,6 +26,9 @@ using Ticks = CollectPace::Ticks;
 
 constexpr std::size_t kReadingsPerTransaction = 60;
 
+// Of the number of processes only the latest is kept.
+constexpr std::uint64_t kReadingsPerCount = 60;
+
 // Reads the machine, and computes values from each reading and the one before.
 class Collector {
  public:
@@ -36,7 +39,10 @@ class Collector {
 
   void read(std::chrono::nanoseconds at) {
     const ValueTime time = valueTimeNow();
-    CollectState now{.at = at, .machine = readMachine(context_.root()), .remainders = {}};
+    const auto processes =
+        count_ % kReadingsPerCount == 0 ? Processes::Counted : Processes::LeftOut;
+    CollectState now{
+        .at = at, .machine = readMachine(context_.root(), processes), .remainders = {}};
     const MachineReading* const before = last_ ? &last_->machine : nullptr;
     const double secondsBetween = last_ ? std::chrono::duration<double>(at - last_->at).count() : 0;
     if (last_) now.remainders = std::move(last_->remainders);
@@ -196,7 +202,7 @@ void collectOnce(ToolContext& context, const std::string& stateFile) {
   if (!recorder) return context.fail(recorder.error().message);
   Collector collector(context, **recorder);
   if (!before) {
-    context.note(format("%s: it is replaced; this sample has no rates", before.error().message));
+    context.note(format("this sample has no rates: %s", before.error().message));
   } else if (*before) {
     collector.startFrom(std::move(**before));
   }

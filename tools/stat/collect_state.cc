@@ -122,7 +122,8 @@ Expected<std::optional<CollectState>> readCollectState(const std::string& path,
   if (!text) return text.error();
   if (!*text) return std::optional<CollectState>();
   auto parsed = parseState(**text);
-  if (!parsed) return Error{format("%s is not a reading of 'tavrelctl stat collect'", path)};
+  if (!parsed)
+    return Error{format("%s is not a reading of 'tavrelctl stat collect': it is replaced", path)};
   const bool isUsable = !boot.empty() && parsed->boot == boot && parsed->state.at <= now &&
                         now - parsed->state.at <= kOldestState;
   if (!isUsable) return std::optional<CollectState>();
