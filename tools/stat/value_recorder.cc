@@ -3,7 +3,6 @@
 #include <brimhold/client.h>
 #include <chrono>
 #include <cstdlib>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include "base/format.h"
@@ -18,8 +17,7 @@ namespace {
 
 class MemoryRecorder final : public ValueRecorder {
  public:
-  explicit MemoryRecorder(std::string folder)
-      : folder_(std::move(folder)), ownsDevice_(ownsDevice(folder_)) {}
+  explicit MemoryRecorder(std::string folder) : folder_(std::move(folder)) {}
 
   Status set(ValueTime, const std::string& key, std::int64_t value) override {
     if (Status allowed = checkRights(key); !allowed) return allowed;
@@ -44,23 +42,17 @@ class MemoryRecorder final : public ValueRecorder {
   bool isInMemory() const override { return true; }
 
  private:
+  // A fold would refuse the value when nobody sees it.
   Status checkRights(std::string_view key) const {
-    if (!isSystemKey(key) || ownsDevice_) return Done{};
+    if (!isSystemKey(key) || isRoot_) return Done{};
     return Error{
         format("only root records keys that begin with com.norvane., such as %s: run as "
                "root or take another key",
                key)};
   }
 
-  // Whether this user is root or owns the folder. A fold would refuse keys of the system that
-  // others have recorded, when nobody sees it.
-  static bool ownsDevice(const std::string& folder) {
-    struct stat status {};
-    return geteuid() == 0 || (stat(folder.c_str(), &status) == 0 && status.st_uid == geteuid());
-  }
-
   std::string folder_;
-  bool ownsDevice_;
+  bool isRoot_ = geteuid() == 0;
 };
 
 class StoreRecorder final : public ValueRecorder {
