@@ -11,6 +11,8 @@
 #include "platform/linux/files/device_file_reader.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/folding/folding_store.h"
+#include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/locale/linux_date_formatting.h"
 #include "platform/linux/locale/linux_locale.h"
 #include "platform/linux/logs/file_crash_reporting.h"
@@ -53,6 +55,8 @@ struct LinuxPlatform::Services {
       options.preferences != nullptr ? *options.preferences : filePreferences;
   SqliteStore store{
       root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
+  SegmentFold fold{root, store, fileSystem, propertyLists, log};
+  FoldingStore foldingStore{store, fold, log};
   FileSubmission submission{root,  fileSystem, propertyLists, preferences, systemVersion,
                             clock, log};
   EccEvents eccEvents{root, fileSystem, propertyLists, log,
@@ -92,7 +96,7 @@ struct LinuxPlatform::Services {
       .propertyLists = propertyLists,
       .stackSnapshots = stackSnapshots,
       .standardStreams = standardStreams,
-      .statistics = store,
+      .statistics = options.readOnly ? static_cast<StatisticsStore&>(store) : foldingStore,
       .submission = submission,
       .systemControls = systemControls,
       .systemVersion = systemVersion,
@@ -121,6 +125,9 @@ FilePreferences& LinuxPlatform::preferences() {
 }
 FileSubmission& LinuxPlatform::submission() {
   return services_->submission;
+}
+SegmentFold& LinuxPlatform::fold() {
+  return services_->fold;
 }
 RecordedRegistry& LinuxPlatform::registry() {
   return services_->drivers;

@@ -41,14 +41,21 @@ TEST_F(Programs, TheToolSaysWhyItCannotRecord) {
                 ": run as root or join the group brimhold\n");
   chmod(folder.c_str(), 01777);
   EXPECT_EQ(outputOf(asNobody + "stat add n 1"), "");
-  EXPECT_EQ(outputOf(asNobody + "stat add com.norvane.n 1", 1),
-            "tavrelctl: only root records keys that begin with com.norvane., such as "
-            "com.norvane.n: run as root or take another key\n");
+  const auto refused = [](const std::string& key) {
+    return "tavrelctl: this user may not record " + key +
+           ": run as root, take another key, or name the user in /etc/tavrel/recorders.plist\n";
+  };
+  EXPECT_EQ(outputOf(asNobody + "stat add com.norvane.n 1", 1), refused("com.norvane.n"));
+  std::filesystem::create_directories(root / "etc/tavrel");
+  outputOf("echo '{\"65534\": [\"com.norvane.n\"]}' | " + kTool + "plist convert - -o " +
+           (root / "etc/tavrel/recorders.plist").string());
+  EXPECT_EQ(outputOf(asNobody + "stat add com.norvane.n 2"), "");
+  EXPECT_EQ(outputOf(asNobody + "stat add n 1", 1), refused("n"));
   // Too small a limit of file sizes is one that the process has.
   EXPECT_EQ(outputOf("ulimit -f 8; " + kTool + "stat add n 1", 1),
             "tavrelctl: cannot record in " + folder.string() +
                 ": memory or a limit of this process is exhausted: run 'tavrelctl stat fold'\n");
-  EXPECT_EQ(foldedScalars(), "n=1 ");
+  EXPECT_EQ(foldedScalars(), "com.norvane.n=2 n=1 ");
 }
 
 TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {

@@ -210,6 +210,43 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
   EXPECT_EQ(keys, (Lines{"d.one", "d.two"}));
 }
 
+TEST_F(StoreTest, PositionsOfSegmentsAreKeptWithTheValues) {
+  const auto named = [](std::uint32_t owner, int number) {
+    SegmentName name{owner, {}};
+    name.identity.back() = static_cast<std::byte>(number);
+    return name;
+  };
+  const SegmentName segments[] = {named(0, 2), named(0, 0), named(0xFFFFFFFF, 2)};
+  const std::string large(138'000, '\0');
+  const std::string positions[] = {"first", "", large};
+  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(0, segments[0].identity), std::nullopt)
+      << "no store yet";
+  for (const bool isCommitted : {false, true}) {
+    auto batch = store_->beginBatch();
+    ASSERT_TRUE((*batch)->setScalar(kToday, "k", 1));
+    EXPECT_EQ(*(*batch)->segmentPosition(0, segments[0].identity), std::nullopt);
+    for (std::size_t i = 0; i < 3; ++i) {
+      ASSERT_TRUE((*batch)->setSegmentPosition(segments[i].owner, segments[i].identity, "early"));
+      ASSERT_TRUE(
+          (*batch)->setSegmentPosition(segments[i].owner, segments[i].identity, positions[i]));
+    }
+    ASSERT_TRUE(!isCommitted || (*batch)->commit());
+  }
+  const auto history = store_->openHistory();
+  ASSERT_TRUE((*history)->beginSnapshot());
+  EXPECT_EQ(*(*history)->segmentPosition(0, segments[1].identity), "");
+  auto batch = store_->beginBatch();
+  EXPECT_EQ(*(*batch)->segmentNames(), (std::vector{segments[1], segments[0], segments[2]}));
+  EXPECT_EQ(*(*batch)->segmentPosition(segments[2].owner, segments[2].identity), large);
+  ASSERT_TRUE((*batch)->removeSegmentPosition(segments[2].owner, segments[2].identity));
+  ASSERT_TRUE((*batch)->commit());
+  EXPECT_EQ(*(*history)->segmentPosition(segments[2].owner, segments[2].identity), large)
+      << "as at the beginning of the snapshot";
+  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(segments[2].owner, segments[2].identity),
+            std::nullopt);
+  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(0, segments[0].identity), "first");
+}
+
 TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   auto batch = store_->beginBatch();
   ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 1, 1));

@@ -9,6 +9,7 @@
 #include "tools/stat/collect.h"
 #include "tools/stat/machine_statistics.h"
 #include "tools/stat/record_commands.h"
+#include "tools/stat/stat_fold.h"
 #include "tools/stat/stat_list.h"
 #include "tools/stat/stat_show.h"
 #include "tools/stat/stat_transfer.h"
@@ -107,6 +108,11 @@ void addStatCommands(Command app, ToolContext& context) {
                  });
   addSelection(listed, *arguments);
   context.addJsonOption(listed);
+
+  const Command folded =
+      addCommand(group, "fold", "Move what programs recorded into the store", arguments, context,
+                 [](ToolContext& tool, const Arguments&) { foldStatistics(tool); });
+  context.addJsonOption(folded);
 
   const Command shown =
       addCommand(group, "show", "Show one statistic: its values by day, and what they come to",

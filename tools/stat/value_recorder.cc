@@ -8,8 +8,11 @@
 #include "base/format.h"
 #include "client/segment_format.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/folding/recorders.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
 #include "tools/stat/import_lines.h"
 
 namespace tavrel {
@@ -17,7 +20,8 @@ namespace {
 
 class MemoryRecorder final : public ValueRecorder {
  public:
-  explicit MemoryRecorder(std::string folder) : folder_(std::move(folder)) {}
+  MemoryRecorder(std::string folder, Recorders recorders)
+      : folder_(std::move(folder)), recorders_(std::move(recorders)) {}
 
   Status set(ValueTime, const std::string& key, std::int64_t value) override {
     if (Status allowed = checkRights(key); !allowed) return allowed;
@@ -44,15 +48,16 @@ class MemoryRecorder final : public ValueRecorder {
  private:
   // A fold would refuse the value when nobody sees it.
   Status checkRights(std::string_view key) const {
-    if (!isSystemKey(key) || isRoot_) return Done{};
+    if (user_ == 0 || recorders_.mayRecord(user_, key)) return Done{};
     return Error{
-        format("only root records keys that begin with com.norvane., such as %s: run as "
-               "root or take another key",
+        format("this user may not record %s: run as root, take another key, or name the "
+               "user in /etc/tavrel/recorders.plist",
                key)};
   }
 
   std::string folder_;
-  bool isRoot_ = geteuid() == 0;
+  Recorders recorders_;
+  uid_t user_ = geteuid();
 };
 
 class StoreRecorder final : public ValueRecorder {
@@ -92,6 +97,16 @@ class StoreRecorder final : public ValueRecorder {
   std::unique_ptr<SqliteBatch> batch_;
 };
 
+// The device's own are read only where they matter: root may record all.
+Recorders recordersOf(ToolContext& context) {
+  const bool isNeeded =
+      geteuid() != 0 && FileSystem::status(context.root().path("/etc/tavrel/recorders.plist"));
+  if (!isNeeded) return {};
+  FileSystem files;
+  Platform& platform = context.platform();
+  return Recorders::read(context.root(), files, platform.propertyLists, platform.log);
+}
+
 }  // namespace
 
 Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
@@ -124,7 +139,8 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
                  "a folder on a tmpfs",
                  folder)};
     default:
-      return std::unique_ptr<ValueRecorder>(std::make_unique<MemoryRecorder>(folder));
+      return std::unique_ptr<ValueRecorder>(
+          std::make_unique<MemoryRecorder>(folder, recordersOf(context)));
   }
 }
 
@@ -148,10 +164,6 @@ std::string keyFault(const std::string& key) {
   }
   if (!isExportable(key)) return format("not a key: %s: give UTF-8 text", key.substr(0, 60));
   return {};
-}
-
-bool isSystemKey(std::string_view key) {
-  return key.starts_with("com.norvane.");
 }
 
 }  // namespace tavrel

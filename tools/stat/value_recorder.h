@@ -9,7 +9,6 @@
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <string_view>
 
 #include "base/expected.h"
 #include "tools/shared/tool_context.h"
@@ -41,8 +40,5 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context);
 
 /// What is wrong with a key; nothing when it can be recorded and exported.
 std::string keyFault(const std::string& key);
-
-/// Whether only root may record the key.
-bool isSystemKey(std::string_view key);
 
 }  // namespace tavrel

@@ -149,16 +149,30 @@ Status SqliteBatch::setScalar(std::int32_t day, std::string_view key, std::int64
   return Done{};
 }
 
+std::optional<std::int64_t> SqliteBatch::readScalar(std::int32_t day, std::string_view key) {
+  checkKey(key);
+  writeScalars();
+  begin();
+  SqliteStatement& statement = statements_->getScalar;
+  statement.bind(1, day);
+  statement.bind(2, key);
+  std::optional<std::int64_t> value;
+  if (statement.step()) value = statement.integer(0);
+  statement.reset();
+  return value;
+}
+
+Expected<std::optional<std::int64_t>> SqliteBatch::scalar(std::int32_t day, std::string_view key) {
+  try {
+    return readScalar(day, key);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
 Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64_t amount) {
   try {
-    checkKey(key);
-    writeScalars();
-    begin();
-    SqliteStatement& statement = statements_->getScalar;
-    statement.bind(1, day);
-    statement.bind(2, key);
-    const std::int64_t value = statement.step() ? statement.integer(0) : 0;
-    statement.reset();
+    const std::int64_t value = readScalar(day, key).value_or(0);
     std::int64_t sum = 0;
     if (__builtin_add_overflow(value, amount, &sum)) {
       return Error{"adding " + std::to_string(amount) + " to " + std::to_string(value) +
@@ -178,6 +192,46 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
     appendDistributionRecord(series.records, {value, secondsInDayOffset});
     pendingBytes_ += kDistributionRecordBytes;
     if (pendingBytes_ >= kPendingBytes) writeDistributions();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Expected<std::optional<std::string>> SqliteBatch::segmentPosition(std::uint32_t owner,
+                                                                  SegmentIdentity identity) {
+  try {
+    begin();
+    return segment_table::position(connection_, owner, identity);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
+  try {
+    begin();
+    return segment_table::names(connection_);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity identity,
+                                       std::string_view position) {
+  try {
+    begin();
+    segment_table::setPosition(connection_, owner, identity, position);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity identity) {
+  try {
+    begin();
+    segment_table::removePosition(connection_, owner, identity);
   } catch (const StoreFailure& failure) {
     return describe(failure);
   }

@@ -23,6 +23,7 @@
 #include "base/expected.h"
 #include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_connection.h"
+#include "platform/linux/store/sqlite_segments.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/statistics_store.h"
 
@@ -41,8 +42,20 @@ class SqliteBatch {
   /// Adds to the day's value, which is 0 when absent. A sum outside of 64 bits is refused and
   /// leaves the value as it was.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t amount);
+  /// The day's value as this batch leaves it; nothing when there is none.
+  Expected<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key);
   Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
                      double value);
+
+  /// How far a segment was folded, as an earlier batch stored it; nothing when unknown. From this
+  /// call on other writers wait, so that nobody else folds the segment until the commit.
+  Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
+                                                       std::span<const std::byte, 16> identity);
+  /// The segments whose positions the store holds, by owner and then by identity.
+  Expected<std::vector<SegmentName>> segmentNames();
+  Status setSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity,
+                            std::string_view position);
+  Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);
 
   /// Keeps the changes and ends the batch.
   Status commit();
@@ -82,6 +95,7 @@ class SqliteBatch {
   void removeTakenValues();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
+  std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
   void writeSeries(const SeriesName& name, std::string_view records);

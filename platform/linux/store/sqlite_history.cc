@@ -286,6 +286,15 @@ Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
   return span;
 }
 
+Expected<std::optional<std::string>> SqliteHistory::segmentPosition(std::uint32_t owner,
+                                                                    SegmentIdentity identity) {
+  std::optional<std::string> position;
+  const Status read =
+      attempt([&] { position = segment_table::position(store_->connection, owner, identity); });
+  if (!read) return read.error();
+  return position;
+}
+
 Status SqliteHistory::beginSnapshot() {
   return attempt([&] { store_->connection.execute("BEGIN"); });
 }

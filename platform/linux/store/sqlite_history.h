@@ -14,6 +14,7 @@
 
 #include "base/expected.h"
 #include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_segments.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/statistics_store.h"
 
@@ -61,6 +62,11 @@ class SqliteHistory : public BHHistory {
   };
   /// The first and the last day in the store; nothing when the store is empty.
   Expected<std::optional<DaySpan>> daysHeld();
+
+  /// How far a segment was folded; nothing when unknown. Agrees with the values that were read
+  /// since `beginSnapshot`.
+  Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
+                                                       std::span<const std::byte, 16> identity);
 
   /// From here on all queries see the store as it is at the first of them.
   Status beginSnapshot();

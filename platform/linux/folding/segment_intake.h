@@ -1,0 +1,91 @@
+// Takes what one segment yields, as far as rights and limits allow.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <limits>
+#include <map>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/scalar_changes.h"
+#include "platform/linux/segments/segment_reader.h"
+
+namespace tavrel {
+
+/// The rows of the store that one fold changes.
+class FoldedRows {
+ public:
+  struct Row {
+    std::int64_t latestSet = std::numeric_limits<std::int64_t>::min();  // of a scalar
+  };
+
+  /// Nothing when the row would be one too many. The first user of a row is charged with it.
+  Row* find(std::uint32_t user, std::int32_t day, std::string_view key, bool isScalar);
+
+ private:
+  std::unordered_map<std::uint64_t, Row> rows_;  // by a keyed hash of its name
+  std::unordered_map<std::uint32_t, std::size_t> counts_;
+};
+
+class SegmentIntake final : public SegmentSink {
+ public:
+  /// All must outlive it. Keys must stay in place as long as it lives.
+  SegmentIntake(std::uint32_t user, const Recorders& recorders, FoldedRows& rows,
+                ScalarChanges& changes)
+      : user_(user), recorders_(recorders), rows_(rows), changes_(changes) {}
+
+  void takeScalar(const SegmentScalar& scalar) override;
+  void takeRecord(const SegmentRecord& record) override;
+
+  /// Passes the measurements on, packed, each key and day once: `take(day, key, records)`. Scalars
+  /// are in the changes already.
+  template <class Take>
+  void eachSeries(Take take) const {
+    for (const auto& [place, series] : series_)
+      if (!series.isRefused) take(series.day, series.key, std::string_view(series.records));
+  }
+
+  std::uint64_t scalars() const { return scalars_; }
+  std::uint64_t values() const { return values_; }
+  std::uint64_t refused() const { return refused_; }
+  /// The first key that the user may not record; empty when there was none.
+  const std::string& foreignKey() const { return foreignKey_; }
+
+ private:
+  // The measurements of a key and a day, packed.
+  struct Series {
+    std::string_view key;
+    std::int32_t day = 0;
+    bool isRefused = false;
+    std::string records;
+  };
+  // A key is known by the place of its name.
+  using Place = std::pair<const char*, std::int32_t>;
+  struct HashPlace {
+    std::size_t operator()(const Place& place) const {
+      return std::hash<const char*>()(place.first) +
+             static_cast<std::size_t>(static_cast<std::uint32_t>(place.second)) * 0x9E3779B1U;
+    }
+  };
+
+  bool mayTake(std::string_view key, std::int32_t day);
+  Series& seriesOf(const SegmentRecord& record);
+
+  const std::uint32_t user_;
+  const Recorders& recorders_;
+  FoldedRows& rows_;
+  ScalarChanges& changes_;
+  std::unordered_map<Place, Series, HashPlace> series_;
+  // Those used lately, by the place of the key.
+  std::array<Series*, 1024> recent_{};
+  std::uint64_t scalars_ = 0;
+  std::uint64_t values_ = 0;
+  std::uint64_t refused_ = 0;
+  std::string foreignKey_;
+};
+
+}  // namespace tavrel
