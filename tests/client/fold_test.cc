@@ -78,12 +78,15 @@ class FoldTest : public Recording {
       if (row.first == key) sum += value;
     return sum;
   }
+  /// All numbers from 0 up.
   void expectEachOnce(std::size_t count) {
-    auto values = records["series"];
+    auto& values = records["series"];
     std::sort(values.begin(), values.end());
     ASSERT_EQ(values.size(), count);
+    std::size_t wrong = 0;
     for (std::size_t i = 0; i < count; ++i)
-      ASSERT_EQ(values[i], static_cast<double>(i));
+      if (values[i] != static_cast<double>(i)) ++wrong;
+    ASSERT_EQ(wrong, 0U);
   }
   std::filesystem::path store() { return LinuxPlatform(DeviceRoot(root)).store().path(); }
 
@@ -97,7 +100,7 @@ TEST_F(FoldTest, AKillAtAnySystemCallLosesAndRepeatsNothing) {
     for (;;) {
       wanted.wait();
       add(1);
-      for (int i = 0; i < 300; ++i)
+      for (int i = 0; i < 30; ++i)
         record(recorded++);
       kill(getpid(), SIGSTOP);
     }
@@ -129,6 +132,66 @@ TEST_F(FoldTest, AKillAtAnySystemCallLosesAndRepeatsNothing) {
   kill(child, SIGKILL);
   waitFor(child);
   EXPECT_EQ(foldNow().removed, 1U);
+}
+
+TEST_F(FoldTest, AKilledProgramLosesAndRepeatsNothing) {
+  auto& progress = shared<std::atomic<int>>();
+  std::mt19937 random(7);
+  for (int round = fromEnvironment("TAVREL_KILL_ROUNDS", 20); round > 0; --round) {
+    SCOPED_TRACE(round);
+    progress = 0;
+    std::filesystem::remove_all(root / "var");
+    const pid_t child = start([&] {
+      for (int i = 0; i < 20'000; ++i) {
+        record(i);
+        add(1);
+        progress.store(i + 1, std::memory_order_release);
+      }
+      pause();
+    });
+    const int until = static_cast<int>(random() % 3000);
+    while (progress < until)
+      sched_yield();
+    if (round % 2 == 0) foldNow();
+    kill(child, SIGKILL);
+    EXPECT_EQ(waitFor(child), SIGKILL);
+    ASSERT_FALSE(foldNow().failure);
+    ASSERT_TRUE(segments().empty());
+    look();
+    const auto& values = records["series"];
+    ASSERT_NO_FATAL_FAILURE(expectEachOnce(values.size()));
+    const std::int64_t done = progress;
+    for (const std::int64_t left : {std::ssize(values), scalar("count")})
+      ASSERT_TRUE(left == done || left == done + 1) << left << " of " << done;
+  }
+}
+
+TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
+  const std::int64_t midnight = (kToday + 1) * 86'400;
+  const std::int64_t days[] = {kToday, kToday + 1, kToday - 400, kToday + 30'000, kToday};
+  const pid_t child = start([&] {
+    for (const std::int64_t day : days) {
+      for (const std::int64_t second : {0, 86'399}) {
+        testClock().realtime = midnight + (day - kToday - 1) * 86'400 + second;
+        add(1);
+        record(static_cast<double>(second));
+      }
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  for (std::size_t i = 0; i < std::size(days); ++i) {
+    waitpid(child, nullptr, WUNTRACED);
+    foldNow();
+    kill(child, SIGCONT);
+  }
+  EXPECT_EQ(waitFor(child), 0);
+  foldNow();
+  look();
+  EXPECT_EQ(scalars, (Scalars{{{"count", kToday - 400}, 2},
+                              {{"count", kToday}, 4},
+                              {{"count", kToday + 1}, 2},
+                              {{"count", kToday + 30'000}, 2}}));
+  EXPECT_EQ(records["series"].size(), 10U);
 }
 
 TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {

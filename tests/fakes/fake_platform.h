@@ -73,14 +73,15 @@ struct FakePreferences : Preferences {
 struct FakeDistribution : BHHistoryDistributionEnumerator {
   explicit FakeDistribution(const std::vector<double>& values) {
     for (const double value : values)
-      appendDistributionRecord(records, {value, 0});
+      appendPackedValue(packed, value);
+    offsets.resize(values.size() * kPackedOffsetBytes);
   }
-  std::string records;
+  std::string packed, offsets;
   bool wasRead = false;
   bool fails = false;  // behind the values
 
-  std::string_view nextBlock() override {
-    if (!std::exchange(wasRead, true)) return records;
+  DistributionBlock nextBlock(bool) override {
+    if (!std::exchange(wasRead, true)) return {packed, offsets};
     if (fails) fail();
     return {};
   }

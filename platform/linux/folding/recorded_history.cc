@@ -31,10 +31,21 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
       : stored_(stored), waiting_(waiting), series_(series) {}
 
  private:
-  std::string_view nextBlock() override {
+  static constexpr std::size_t kAtOnce = 1024;
+
+  DistributionBlock nextBlock(bool wantsOffsets) override {
+    values_.clear();
+    offsets_.clear();
     if (stored_ != nullptr) {
-      if (const std::string_view records = stored_->nextRecords(); !records.empty()) {
-        return records;
+      if (wantsOffsets) {
+        DistributionSample sample;
+        while (values_.size() < kAtOnce * kPackedValueBytes &&
+               stored_->getNextValue(sample.value, sample.secondsInDayOffset)) {
+          append(sample);
+        }
+        if (!values_.empty()) return {values_, offsets_};
+      } else if (const std::string_view values = stored_->nextValues(); !values.empty()) {
+        return {values, {}};
       }
       if (stored_->failed()) {
         fail();
@@ -42,16 +53,25 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
       }
       stored_ = nullptr;
     }
-    const std::size_t size = waiting_.readSeries(series_, at_, block_);
-    at_ += size;
-    return asText(ByteSpan(block_).first(size));
+    std::array<DistributionSample, kAtOnce> samples;
+    const std::size_t count = waiting_.readSeries(series_, at_, samples);
+    at_ += count;
+    for (std::size_t i = 0; i < count; ++i)
+      append(samples[i]);
+    return {values_, offsets_};
+  }
+
+  void append(const DistributionSample& sample) {
+    appendPackedValue(values_, sample.value);
+    appendPackedOffset(offsets_, sample.secondsInDayOffset);
   }
 
   BHHistoryDistributionEnumerator* stored_;
   const WaitingValues& waiting_;
   const WaitingValues::Series& series_;
   std::uint64_t at_ = 0;
-  std::array<std::byte, 1024 * kDistributionRecordBytes> block_;
+  std::string values_;
+  std::string offsets_;
 };
 
 std::int64_t changed(const ScalarChanges::Change& change, std::int64_t stored) {

@@ -9,7 +9,6 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/text.h"
-#include "platform/distribution_record.h"
 #include "platform/linux/folding/fold_notes.h"
 #include "platform/linux/folding/recorders.h"
 #include "platform/linux/folding/scalar_changes.h"
@@ -36,11 +35,8 @@ struct FoldedSegment {
 
 Status giveTo(SqliteBatch& batch, const SegmentIntake& intake) {
   Status done = Done{};
-  intake.eachSeries([&](std::int32_t day, std::string_view key, std::string_view records) {
-    for (std::size_t at = 0; done && at < records.size(); at += kDistributionRecordBytes) {
-      const DistributionSample sample = distributionSampleAt(records.data() + at);
-      done = batch.appendValue(day, key, sample.secondsInDayOffset, sample.value);
-    }
+  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
+    if (done) done = batch.appendValues(day, key, samples);
   });
   return done;
 }

@@ -2,7 +2,6 @@
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
-#include "platform/distribution_record.h"
 
 namespace tavrel {
 namespace {
@@ -67,7 +66,7 @@ void SegmentIntake::takeRecord(const SegmentRecord& record) {
   Series& series = seriesOf(record);
   if (series.isRefused) return void(++refused_);
   ++values_;
-  appendDistributionRecord(series.records, {record.value, record.secondsInDay});
+  series.samples.push_back({record.value, record.secondsInDay});
 }
 
 }  // namespace tavrel

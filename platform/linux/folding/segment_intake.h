@@ -4,12 +4,13 @@
 #include <array>
 #include <cstdint>
 #include <limits>
-#include <map>
+#include <span>
 #include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
 
+#include "platform/distribution_values.h"
 #include "platform/linux/folding/recorders.h"
 #include "platform/linux/folding/scalar_changes.h"
 #include "platform/linux/segments/segment_reader.h"
@@ -41,12 +42,12 @@ class SegmentIntake final : public SegmentSink {
   void takeScalar(const SegmentScalar& scalar) override;
   void takeRecord(const SegmentRecord& record) override;
 
-  /// Passes the measurements on, packed, each key and day once: `take(day, key, records)`. Scalars
-  /// are in the changes already.
+  /// Passes the measurements on, each key and day once: `take(day, key, samples)`. Scalars are in
+  /// the changes already.
   template <class Take>
   void eachSeries(Take take) const {
     for (const auto& [place, series] : series_)
-      if (!series.isRefused) take(series.day, series.key, std::string_view(series.records));
+      if (!series.isRefused) take(series.day, series.key, std::span(series.samples));
   }
 
   std::uint64_t scalars() const { return scalars_; }
@@ -56,12 +57,12 @@ class SegmentIntake final : public SegmentSink {
   const std::string& foreignKey() const { return foreignKey_; }
 
  private:
-  // The measurements of a key and a day, packed.
+  // The measurements of a key and a day.
   struct Series {
     std::string_view key;
     std::int32_t day = 0;
     bool isRefused = false;
-    std::string records;
+    std::vector<DistributionSample> samples;
   };
   // A key is known by the place of its name.
   using Place = std::pair<const char*, std::int32_t>;

@@ -5,7 +5,6 @@
 #include <unistd.h>
 
 #include "base/limits.h"
-#include "platform/distribution_record.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/segments/segment_writer.h"
 
@@ -80,42 +79,43 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
   SelectingSink sink(selection, intake);
   reader.read(position, currentBootInstant(), isWriterGone, sink);
   Status added = Done{};
-  intake.eachSeries([&](std::int32_t day, std::string_view key, std::string_view records) {
-    if (added) added = addSeries(selection, day, key, records);
+  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
+    if (added) added = addSeries(selection, day, key, samples);
   });
   return added;
 }
 
 Status WaitingValues::addSeries(const RowSelection& selection, std::int32_t day,
-                                std::string_view key, std::string_view records) {
+                                std::string_view key, std::span<const DistributionSample> samples) {
   auto found = distributions_.find(std::pair(day, key));
   if (found == distributions_.end()) {
     found = distributions_.emplace(RowName(day, key), Series()).first;
   }
   Series& series = found->second;
-  series.count += static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
+  series.count += std::ssize(samples);
   if (!selection.hasValues) return Done{};
-  if (::write(copied_.get(), records.data(), records.size()) !=
-      static_cast<ssize_t>(records.size())) {
+  if (::write(copied_.get(), samples.data(), samples.size_bytes()) !=
+      static_cast<ssize_t>(samples.size_bytes())) {
     return systemError("copy", "segments");
   }
-  series.blocks.push_back({copiedBytes_, records.size()});
-  copiedBytes_ += records.size();
+  series.blocks.push_back({copies_, samples.size()});
+  copies_ += samples.size();
   ++blocks_;
   return Done{};
 }
 
 std::size_t WaitingValues::readSeries(const Series& series, std::uint64_t at,
-                                      MutableByteSpan into) const {
+                                      std::span<DistributionSample> into) const {
   for (const Series::Block& block : series.blocks) {
-    if (at >= block.bytes) {
-      at -= block.bytes;
+    if (at >= block.count) {
+      at -= block.count;
       continue;
     }
-    const std::size_t size = std::min<std::uint64_t>(block.bytes - at, into.size());
-    const ssize_t got =
-        pread(copied_.get(), into.data(), size, static_cast<off_t>(block.offset + at));
-    return got > 0 ? static_cast<std::size_t>(got) : 0;
+    const std::span<DistributionSample> part =
+        into.first(std::min<std::uint64_t>(block.count - at, into.size()));
+    const auto offset = static_cast<off_t>((block.first + at) * sizeof(DistributionSample));
+    const ssize_t got = pread(copied_.get(), part.data(), part.size_bytes(), offset);
+    return got > 0 ? static_cast<std::size_t>(got) / sizeof(DistributionSample) : 0;
   }
   return 0;
 }

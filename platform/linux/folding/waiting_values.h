@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstdint>
+#include <span>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -36,8 +37,8 @@ class WaitingValues {
   /// The measurements of one row: where they are among the copied ones.
   struct Series {
     struct Block {
-      std::uint64_t offset;
-      std::uint64_t bytes;
+      std::uint64_t first;  // number of a measurement
+      std::uint64_t count;
     };
     std::vector<Block> blocks;
     std::int64_t count = 0;
@@ -53,22 +54,24 @@ class WaitingValues {
   /// Segments that were left out because of a limit.
   std::uint64_t leftOut() const { return leftOut_; }
 
-  /// Up to `into.size()` packed bytes of the row from `at` on; 0 at its end or on failure.
-  std::size_t readSeries(const Series& series, std::uint64_t at, MutableByteSpan into) const;
+  /// Measurements of the row from number `at` on, at most as many as fit; 0 at its end or on
+  /// failure.
+  std::size_t readSeries(const Series& series, std::uint64_t at,
+                         std::span<DistributionSample> into) const;
 
  private:
   WaitingValues() = default;
   Status add(const OpenSegment& segment, const Recorders& recorders, SqliteHistory* history,
              const RowSelection& selection, FoldedRows& rows);
   Status addSeries(const RowSelection& selection, std::int32_t day, std::string_view key,
-                   std::string_view records);
+                   std::span<const DistributionSample> samples);
 
   ScalarChanges scalars_;
   RowMap<Series> distributions_;
   std::uint64_t leftOut_ = 0;
-  // Packed measurements in the order of segments, in memory of the kernel that is not mapped.
+  // Measurements in the order of segments, in memory of the kernel that is not mapped.
   Descriptor copied_;
-  std::uint64_t copiedBytes_ = 0;
+  std::uint64_t copies_ = 0;
   std::size_t blocks_ = 0;
 };
 

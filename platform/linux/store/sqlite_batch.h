@@ -15,12 +15,15 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
 
 #include "base/expected.h"
+#include "platform/distribution_values.h"
+#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_connection.h"
 #include "platform/linux/store/sqlite_segments.h"
@@ -46,6 +49,8 @@ class SqliteBatch {
   Expected<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key);
   Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
                      double value);
+  Status appendValues(std::int32_t day, std::string_view key,
+                      std::span<const DistributionSample> samples);
 
   /// How far a segment was folded, as an earlier batch stored it; nothing when unknown. From this
   /// call on other writers wait, so that nobody else folds the segment until the commit.
@@ -76,10 +81,11 @@ class SqliteBatch {
   struct HashName {
     std::size_t operator()(const SeriesName& name) const;
   };
-  // Values that wait to be written, as chunk records. Names in the map borrow `key`.
+  // Values that wait to be written, packed. Names in the map borrow `key`.
   struct PendingSeries {
     std::string key;
-    std::string records;
+    std::string values;
+    std::string offsets;
   };
   // A scalar that waits to be written; its key is in `scalarKeys_`.
   struct PendingScalar {
@@ -93,13 +99,16 @@ class SqliteBatch {
   void begin();
   void takeKeptValues();
   void removeTakenValues();
+  void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
   std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
-  void writeSeries(const SeriesName& name, std::string_view records);
-  std::int64_t newSeries();
+  void writeSeries(const SeriesName& name, const DistributionBlock& added);
+  std::optional<PendingSeries> takeOut(std::span<const ChunkRun> runs);
+  ChunkRun writeRun(const DistributionBlock& block);
+  void addChunks(std::string_view data, std::size_t bytesPerChunk);
   Error describe(const StoreFailure& failure) const;
 
   SqliteConnection connection_;
@@ -114,7 +123,7 @@ class SqliteBatch {
   std::size_t pendingBytes_ = 0;  // of `pending_`
   // Values of one distribution often follow each other.
   const PendingMap::value_type* last_ = nullptr;
-  std::int64_t nextSeries_ = -1;  // not looked up yet when negative
+  std::int64_t nextChunk_ = -1;  // not looked up yet when negative
 };
 
 }  // namespace tavrel

@@ -20,6 +20,8 @@
 
 namespace tavrel {
 
+class ChunkReader;
+
 class SqliteHistory : public BHHistory {
  public:
   /// A history without a store has no rows. `identity` is the store's file as it was before it was
@@ -79,8 +81,8 @@ class SqliteHistory : public BHHistory {
   using FailureHandler = std::function<void(const StoreFailure& failure)>;
   void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
                          const FailureHandler& tell);
-  static void readRow(SqliteStatement& row, SqliteStatement& chunks,
-                      const CountedRowHandler& rowHandler, const FailureHandler& tell, bool& stop);
+  void readRow(SqliteStatement& row, ChunkReader& reader, const CountedRowHandler& rowHandler,
+               const FailureHandler& tell, bool& stop) const;
   template <class Read>
   void readUnchanged(Read read);
   void checkUnchanged() const;
@@ -93,6 +95,7 @@ class SqliteHistory : public BHHistory {
   StoreSite site_;
   std::optional<FileIdentity> identity_;
   std::optional<ReadableStore> store_;
+  std::int64_t version_ = kSchemaVersion;  // as it was when the query began
 };
 
 }  // namespace tavrel

@@ -7,10 +7,6 @@
 namespace tavrel::segment_table {
 namespace {
 
-bool exists(SqliteConnection& connection) {
-  return connection.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'segments'") != 0;
-}
-
 void bindName(SqliteStatement& statement, std::uint32_t owner, SegmentIdentity identity) {
   statement.bind(1, std::int64_t{owner});
   statement.bind(2, asText(identity));
@@ -20,7 +16,6 @@ void bindName(SqliteStatement& statement, std::uint32_t owner, SegmentIdentity i
 
 std::optional<std::string> position(SqliteConnection& connection, std::uint32_t owner,
                                     SegmentIdentity identity) {
-  if (!exists(connection)) return std::nullopt;
   SqliteStatement statement(connection,
                             "SELECT position FROM segments WHERE owner = ?1 AND identity = ?2");
   bindName(statement, owner, identity);
@@ -30,7 +25,6 @@ std::optional<std::string> position(SqliteConnection& connection, std::uint32_t 
 
 std::vector<SegmentName> names(SqliteConnection& connection) {
   std::vector<SegmentName> found;
-  if (!exists(connection)) return found;
   SqliteStatement rows(connection, "SELECT owner, identity FROM segments ORDER BY owner, identity");
   while (rows.step()) {
     SegmentName& name = found.emplace_back();
@@ -44,11 +38,6 @@ std::vector<SegmentName> names(SqliteConnection& connection) {
 
 void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity,
                  std::string_view position) {
-  if (!exists(connection)) {
-    connection.execute(
-        "CREATE TABLE segments (owner INTEGER NOT NULL, identity BLOB NOT NULL, "
-        "position BLOB NOT NULL, PRIMARY KEY (owner, identity)) STRICT, WITHOUT ROWID");
-  }
   SqliteStatement statement(
       connection,
       "INSERT OR REPLACE INTO segments (owner, identity, position) VALUES (?1, ?2, ?3)");
@@ -58,7 +47,6 @@ void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdent
 }
 
 void removePosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity) {
-  if (!exists(connection)) return;
   SqliteStatement statement(connection, "DELETE FROM segments WHERE owner = ?1 AND identity = ?2");
   bindName(statement, owner, identity);
   statement.run();

@@ -24,7 +24,7 @@ struct SegmentName {
   bool operator==(const SegmentName&) const = default;
 };
 
-/// The operations throw `StoreFailure`.
+/// The operations throw `StoreFailure`. Version 1 of the schema has no such table.
 namespace segment_table {
 
 std::optional<std::string> position(SqliteConnection& connection, std::uint32_t owner,
