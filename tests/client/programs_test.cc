@@ -73,6 +73,10 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   };
   write("proc/sys/kernel/random/boot_id", "boot-1\n");
   write("proc/loadavg", "0.5 0 0 1/1 1\n");
+  const auto receive = [&](int bytes) {
+    write("proc/net/dev", "\n\neth0: " + std::to_string(bytes) + " 0 0 0 0 0 0 0 0 0\n");
+  };
+  receive(0);
   write("proc/stat", "cpu  10 0 0 90 0 0 0 0\ncpu0 1\n");
   EXPECT_EQ(outputOf(once), "");
   EXPECT_EQ(sums(), "samples=1");
@@ -80,6 +84,13 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   EXPECT_EQ(outputOf(once), "");
   EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=2");
   EXPECT_EQ(records["com.norvane.usage.cpu.busy_percent"], std::vector<double>{35});
+
+  // What is below one KiB is kept for the next run.
+  for (const int bytes : {1536, 3072}) {
+    receive(bytes);
+    EXPECT_EQ(outputOf(once), "");
+  }
+  EXPECT_NE(foldedScalars().find("network.received_kib=3 "), std::string::npos);
 
   // No comparison with another start of the machine, nor with what is no reading.
   write("proc/stat", "cpu  20 0 0 110 0 0 0 0\ncpu0 1\n");
@@ -101,7 +112,7 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   write("run/tavrel/collect.state",
         "tavrel-collect 1\nboot boot-2\nat 9000000000000000000\ncpu 0 0\nend\n");
   EXPECT_EQ(outputOf(once), "");
-  EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=13");
+  EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=15");
   EXPECT_TRUE(outputOf(once + " --state " + root.string(), 1).ends_with("Is a directory\n"));
 }
 

@@ -44,7 +44,9 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
     recorder.take("hits:1|c\nhits:2|c|@0.1\n\nhits:1:2|c|#tag\n");
     for (int i = 0; i < 3; ++i)
       recorder.take("thirds:1|c|@0.3");
-    recorder.take("level:7.5|g\nlevel:+0.75|g\nlevel:-2|g");
+    for (int i = 0; i < 10; ++i)
+      recorder.take("tenths:0.1|c");
+    recorder.take("level:3.9|g\nlevel:7.5|g\nlevel:+0.75|g\nlevel:-2|g");
     recorder.take("time:3.5|ms\ntime:4|h|@0.5\ntime:5|d|@0.00001");
     recorder.take("time:9|c");  // a scalar may have the name of a series
     recorder.take("bad\nset:1|s\n" + std::string(1023, 'n') + ":1|c");
@@ -53,6 +55,7 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
   fold();
   const Scalars expected{{{"s.hits", kToday}, 24},
                          {{"s.thirds", kToday}, 10},
+                         {{"s.tenths", kToday}, 1},
                          {{"s.level", kToday}, 6},
                          {{"s.time", kToday}, 9},
                          {{"s.tavrel-statsd.malformed", kToday}, 1},
@@ -75,11 +78,11 @@ TEST_F(Statsd, CountsLinesOfKeysBeyondTheLimits) {
   run([] {
     StatsdRecorder recorder("");
     for (int i = 100; i < 400; ++i)
-      recorder.take(std::to_string(i) + std::string(1000, 'n') + ":1|c");
+      recorder.take(std::to_string(i) + std::string(1001, 'n') + ":1|c");
   });
   fold();
   EXPECT_EQ(scalar("4091"), 2);
-  const int fits = (kBHNamesBytes - 4 * 25) / 1003;
+  const int fits = (kBHNamesBytes - 4 * 25) / 1004;  // exactly
   EXPECT_EQ(fault("refused", ""), 2 * 4 + 300 - fits);
   EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4 + 1} + fits);
 }
