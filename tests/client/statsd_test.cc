@@ -77,13 +77,13 @@ TEST_F(Statsd, CountsLinesOfKeysBeyondTheLimits) {
   });
   run([] {
     StatsdRecorder recorder("");
-    for (int i = 100; i < 400; ++i)
-      recorder.take(std::to_string(i) + std::string(1001, 'n') + ":1|c");
+    for (int i = 1000; i < 4000; ++i)
+      recorder.take(std::to_string(i) + std::string(95, 'n') + ":1|c");
   });
   fold();
   EXPECT_EQ(scalar("4091"), 2);
-  const int fits = (kBHNamesBytes - 4 * 25) / 1004;  // exactly
-  EXPECT_EQ(fault("refused", ""), 2 * 4 + 300 - fits);
+  const int fits = (kBHNamesBytes - 91) / 99;  // exactly: 91 bytes are its own keys
+  EXPECT_EQ(fault("refused", ""), 2 * 4 + 3000 - fits);
   EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4 + 1} + fits);
 }
 
