@@ -67,8 +67,9 @@ void FoldNotes::save() {
     storeLittle64(bytes, 0, told);
     content += asText(bytes);
   }
-  // Lines are told again when this fails.
-  static_cast<void>(pwrite(file_.get(), content.data(), content.size(), 0));
+  if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
+    log_.log(LogLevel::Error, "cannot write %s: refusals will be told again", kLockPath);
+  }
 }
 
 }  // namespace tavrel

@@ -2,6 +2,7 @@
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
+#include "client/segment_format.h"
 
 namespace tavrel {
 namespace {
@@ -45,12 +46,10 @@ void SegmentIntake::takeScalar(const SegmentScalar& scalar) {
 }
 
 SegmentIntake::Series& SegmentIntake::seriesOf(const SegmentRecord& record) {
-  const auto place = reinterpret_cast<std::uintptr_t>(record.key.data());
-  Series*& recent = recent_[(place >> 4 ^ place >> 14) % recent_.size()];
-  if (recent != nullptr && recent->key.data() == record.key.data() && recent->day == record.day) {
-    return *recent;
-  }
-  const auto [found, isNew] = series_.try_emplace({record.key.data(), record.day});
+  if (recent_.empty()) recent_.resize(kBHKeys + 1);
+  Series*& recent = recent_[record.keyNumber];
+  if (recent != nullptr && recent->day == record.day) return *recent;
+  const auto [found, isNew] = series_.try_emplace({record.keyNumber, record.day});
   Series& series = found->second;
   if (isNew) {
     series.key = record.key;

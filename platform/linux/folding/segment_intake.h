@@ -1,9 +1,9 @@
 // Takes what one segment yields, as far as rights and limits allow.
 #pragma once
 
-#include <array>
 #include <cstdint>
 #include <limits>
+#include <map>
 #include <span>
 #include <string>
 #include <string_view>
@@ -34,7 +34,7 @@ class FoldedRows {
 
 class SegmentIntake final : public SegmentSink {
  public:
-  /// All must outlive it. Keys must stay in place as long as it lives.
+  /// All must outlive it. So must the reader of the segment.
   SegmentIntake(std::uint32_t user, const Recorders& recorders, FoldedRows& rows,
                 ScalarChanges& changes)
       : user_(user), recorders_(recorders), rows_(rows), changes_(changes) {}
@@ -46,7 +46,7 @@ class SegmentIntake final : public SegmentSink {
   /// the changes already.
   template <class Take>
   void eachSeries(Take take) const {
-    for (const auto& [place, series] : series_)
+    for (const auto& [name, series] : series_)
       if (!series.isRefused) take(series.day, series.key, std::span(series.samples));
   }
 
@@ -64,15 +64,6 @@ class SegmentIntake final : public SegmentSink {
     bool isRefused = false;
     std::vector<DistributionSample> samples;
   };
-  // A key is known by the place of its name.
-  using Place = std::pair<const char*, std::int32_t>;
-  struct HashPlace {
-    std::size_t operator()(const Place& place) const {
-      return std::hash<const char*>()(place.first) +
-             static_cast<std::size_t>(static_cast<std::uint32_t>(place.second)) * 0x9E3779B1U;
-    }
-  };
-
   bool mayTake(std::string_view key, std::int32_t day);
   Series& seriesOf(const SegmentRecord& record);
 
@@ -80,9 +71,8 @@ class SegmentIntake final : public SegmentSink {
   const Recorders& recorders_;
   FoldedRows& rows_;
   ScalarChanges& changes_;
-  std::unordered_map<Place, Series, HashPlace> series_;
-  // Those used lately, by the place of the key.
-  std::array<Series*, 1024> recent_{};
+  std::map<std::pair<std::uint32_t, std::int32_t>, Series> series_;  // by key's number and day
+  std::vector<Series*> recent_;  // of each key, the one used last
   std::uint64_t scalars_ = 0;
   std::uint64_t values_ = 0;
   std::uint64_t refused_ = 0;

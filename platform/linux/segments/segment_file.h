@@ -3,10 +3,10 @@
 
 #include <array>
 #include <cstdint>
-#include <map>
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "base/bytes.h"
 
@@ -33,11 +33,13 @@ class SegmentFile {
 
   SegmentFacts facts() const;
 
-  /// The name of the key with this number; nothing when there is no valid one of this kind.
+  /// The name of the key with this number; nothing when there is no valid one of this kind. It
+  /// stays in place as long as this object lives.
   std::optional<std::string_view> key(std::uint32_t number, std::uint8_t kind);
 
  private:
   struct Key {
+    bool isRead = false;
     std::uint8_t kind = 0;
     std::string name;
   };
@@ -45,7 +47,7 @@ class SegmentFile {
   Key readKey(std::uint32_t number) const;
 
   int descriptor_;
-  std::map<std::uint32_t, Key> keys_;
+  std::vector<Key> keys_;  // by number, once one was asked for
 };
 
 }  // namespace tavrel

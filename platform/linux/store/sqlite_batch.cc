@@ -17,7 +17,7 @@ namespace {
 constexpr std::size_t kPendingBytes = 8U << 20;
 
 // A longer log is moved into the database after a commit.
-constexpr off_t kLogBytes = 4 << 20;
+constexpr off_t kLogBytes = 1 << 20;
 
 // The memory of a waiting distribution, without its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
@@ -205,10 +205,22 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
 
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
-  for (const DistributionSample& sample : samples) {
-    if (Status added = appendValue(day, key, sample.secondsInDayOffset, sample.value); !added) {
-      return added;
+  try {
+    PendingSeries& series = pendingSeries({day, key});
+    const std::size_t held = series.offsets.size() / kPackedOffsetBytes;
+    series.values.resize((held + samples.size()) * kPackedValueBytes);
+    series.offsets.resize((held + samples.size()) * kPackedOffsetBytes);
+    const MutableByteSpan values = std::as_writable_bytes(std::span(series.values));
+    const MutableByteSpan offsets = std::as_writable_bytes(std::span(series.offsets));
+    for (std::size_t i = 0; i < samples.size(); ++i) {
+      storeLittle64(values, (held + i) * kPackedValueBytes,
+                    std::bit_cast<std::uint64_t>(samples[i].value));
+      storeLittle32(offsets, (held + i) * kPackedOffsetBytes, samples[i].secondsInDayOffset);
     }
+    pendingBytes_ += samples.size() * (kPackedValueBytes + kPackedOffsetBytes);
+    if (pendingBytes_ >= kPendingBytes) writeDistributions();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
   }
   return Done{};
 }
@@ -384,6 +396,11 @@ void SqliteBatch::addChunks(std::string_view data, std::size_t bytesPerChunk) {
     statement.bind(2, data.substr(0, bytesPerChunk));
     statement.run();
   }
+}
+
+SqliteConnection SqliteBatch::release() {
+  statements_.reset();
+  return std::move(connection_);
 }
 
 // The changes are kept already, so that the log may stay as it is for now.

@@ -68,6 +68,8 @@ class SqliteBatch {
   /// As `setScalar` and `commit`, for use inside the store: they throw `StoreFailure`.
   void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void finish();
+  /// The connection, when the batch has been finished.
+  SqliteConnection release();
 
  private:
   struct Statements;
