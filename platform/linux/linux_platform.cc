@@ -11,6 +11,7 @@
 #include "platform/linux/files/device_file_reader.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/live/live_machine.h"
 #include "platform/linux/locale/linux_date_formatting.h"
 #include "platform/linux/locale/linux_locale.h"
 #include "platform/linux/logs/file_crash_reporting.h"
@@ -68,7 +69,8 @@ struct LinuxPlatform::Services {
   LinuxDateFormatting dateFormatting{root};
   LinuxProcess process;
   LinuxStandardStreams standardStreams{systemLog};
-  RecordedRegistry drivers{root, fileSystem, propertyLists, log};
+  LiveMachine live{root, log};
+  RecordedRegistry drivers{root, fileSystem, propertyLists, log, &live};
   RecordedSnapshots stackSnapshots{root, fileSystem, log};
   ProcessState state;
 
