@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <unordered_map>
 
+#include "base/format.h"
 #include "base/limits.h"
 
 namespace tavrel::live {
@@ -23,7 +24,8 @@ std::string lineOf(const std::string& path, std::vector<char>& buffer) {
 // Reading a drive's sensor would wake the drive.
 std::vector<std::string> powerStatusOf(const std::string& path) {
   std::vector<std::string> files;
-  for (const char* const file : {"/device/power/runtime_status", "/device/device/power/runtime_status"}) {
+  for (const char* const file :
+       {"/device/power/runtime_status", "/device/device/power/runtime_status"}) {
     if (exists(path + file)) files.push_back(path + file);
   }
   return files;
@@ -45,14 +47,18 @@ bool fitsPattern(std::string_view name, std::string_view pattern, std::string_vi
 
 std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view folder,
                                    std::string_view entry, std::string_view label,
-                                   bool alwaysWithDevice) {
+                                   bool alwaysWithDevice, LiveSource& source) {
   const std::string base = root.path(folder);
   std::vector<NamedDevice> devices;
   std::vector<std::string> entries;
   std::unordered_map<std::string, std::size_t> counts;
   std::vector<char> buffer;
   for (std::string& name : namesIn(base)) {
-    if (!name.starts_with(entry) || devices.size() == limits::kLiveDevices) continue;
+    if (!name.starts_with(entry)) continue;
+    if (devices.size() == limits::kLiveDevices) {
+      source.note(format("%s: only the first %zu devices are shown", base, devices.size()));
+      break;
+    }
     std::string path = base + '/' + name;
     std::string called = label.empty() ? name : lineOf(path + '/' + std::string(label), buffer);
     if (called.empty()) called = name;
@@ -77,8 +83,8 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
 
 void addAttributes(const std::string& path, const Place& place, const std::string& prefix,
                    std::span<const Attribute> attributes, Speed speed, LiveSource& source) {
-  const auto add = [&](const Attribute& attribute, const std::string& file,
-                       std::string_view number, const std::vector<std::string>& powerStatus) {
+  const auto add = [&](const Attribute& attribute, const std::string& file, std::string_view number,
+                       const std::vector<std::string>& powerStatus) {
     const std::uint32_t slot = source.addNumberFile(file, attribute.scale, speed, powerStatus);
     source.addSimple({place.group, place.subGroup, attribute.unit},
                      prefix + withNumber(attribute.channel, number), slot,
@@ -110,7 +116,7 @@ void addAttributes(const std::string& path, const Place& place, const std::strin
 
 void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSource& source) {
   for (const NamedDevice& device : devicesIn(root, devices.folder, devices.entry, devices.label,
-                                             devices.alwaysWithDevice)) {
+                                             devices.alwaysWithDevice, source)) {
     addAttributes(device.path, {devices.group, device.name, kPlain}, device.name + '.',
                   devices.attributes, devices.speed, source);
     if (devices.part.empty()) continue;

@@ -38,14 +38,15 @@ struct DeviceClass {
 
 void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSource& source);
 
-/// The folders of devices below `folder` and the names that channels have for them.
+/// The folders of devices below `folder` and the names that channels have for them. Notes of the
+/// source say when there are more than are shown.
 struct NamedDevice {
   std::string path;
   std::string name;
 };
 std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view folder,
                                    std::string_view entry, std::string_view label,
-                                   bool alwaysWithDevice);
+                                   bool alwaysWithDevice, LiveSource& source);
 
 /// The figures of one device.
 void addAttributes(const std::string& path, const Place& place, const std::string& prefix,

@@ -63,7 +63,9 @@ class InterruptReader final : public TextReader {
  public:
   explicit InterruptReader(std::uint32_t processors) : processors_(processors) {}
 
-  void addRow(std::string key, std::uint32_t firstSlot) { rows_.emplace(std::move(key), firstSlot); }
+  void addRow(std::string key, std::uint32_t firstSlot) {
+    rows_.emplace(std::move(key), firstSlot);
+  }
 
   // Rows that share their slots add up.
   void read(std::string_view text, std::span<std::int64_t> slots) const override {
@@ -121,8 +123,8 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
     if (isNew) names.emplace_back(name, at->second);
     reader->addRow(std::move(key), at->second);
   }
-  const std::uint32_t first = source.addTextFile(
-      path, static_cast<std::uint32_t>(names.size()) * width, std::move(reader));
+  const std::uint32_t first =
+      source.addTextFile(path, static_cast<std::uint32_t>(names.size()) * width, std::move(reader));
   for (auto& [name, slot] : names)
     source.addArray({"Interrupts", group, kEvents}, std::move(name), first + slot, width);
 }

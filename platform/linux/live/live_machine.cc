@@ -73,16 +73,16 @@ class LiveMachine::State {
  public:
   State(const DeviceRoot& root, SystemLog& log, const Options& options)
       : slowReads_(log, {options.oneSensorMilliseconds, options.allSensorsMilliseconds}) {
-    if (!isFolder(root.path("/sys")) && !isFolder(root.path("/proc"))) return;
+    if (!isFolder(root.path("/proc"))) return;
     for (const SourceEntry& entry : kSources) {
       LiveSource source(entry.className, entry.name);
       entry.add(root, source);
-      keep(std::move(source));
+      keep(std::move(source), log);
     }
     for (const DeviceClass& devices : deviceClasses()) {
       LiveSource source(devices.className, devices.name);
       addDeviceClass(root, devices, source);
-      keep(std::move(source));
+      keep(std::move(source), log);
     }
     for (std::size_t i = 0; i < sources_.size(); ++i) {
       sources_[i].forEachChannel([&](const LiveChannel& channel) {
@@ -114,7 +114,9 @@ class LiveMachine::State {
   }
 
  private:
-  void keep(LiveSource source) {
+  void keep(LiveSource source, SystemLog& log) {
+    for (const std::string& note : source.notes())
+      log.write(LogLevel::Default, note);
     source.publishFolds();
     if (!source.empty()) sources_.push_back(std::move(source));
   }
@@ -157,8 +159,8 @@ class LiveMachine::State {
   std::shared_ptr<SlowFile> slowFile(std::size_t source, std::size_t file) {
     std::shared_ptr<SlowFile>& known = slowFiles_[{source, file}];
     if (!known) {
-      known = std::make_shared<SlowFile>(sources_[source].files()[file].file.path(),
-                                         budget_.take());
+      known =
+          std::make_shared<SlowFile>(sources_[source].files()[file].file.path(), budget_.take());
     }
     return known;
   }

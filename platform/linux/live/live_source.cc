@@ -115,8 +115,8 @@ plist::Dictionary LiveSource::service() const {
     entry.set(groupKey, group.group);
     if (!group.subGroup.empty()) entry.set(subGroupKey, group.subGroup);
     if (group.unit != kPlain) {
-      entry.set(infoKey, plist::Dictionary{
-                             {"IOReportChannelUnit", static_cast<std::int64_t>(group.unit)}});
+      entry.set(infoKey,
+                plist::Dictionary{{"IOReportChannelUnit", static_cast<std::int64_t>(group.unit)}});
     }
     entry.set(channelsKey, channels);
     legend.append(entry);

@@ -58,7 +58,7 @@ struct LiveChannel {
 /// The states of a residency.
 struct Residency {
   std::vector<std::uint64_t> ids;
-  std::vector<std::int64_t> numbers;  // by which the kernel calls them; empty when it does not
+  std::vector<std::int64_t> numbers;       // by which the kernel calls them; empty when it does not
   std::uint32_t currentSlot = UINT32_MAX;  // holds the number of the current one
 };
 
@@ -80,7 +80,7 @@ struct LiveFile {
   KernelFile file;
   std::uint32_t firstSlot;
   std::uint32_t slots;
-  Scale scale;                               // of the file's one number, without a reader
+  Scale scale;  // of the file's one number, without a reader
   std::unique_ptr<const TextReader> reader;
   Speed speed = Speed::Quick;
   std::vector<std::string> powerStatus = {};  // files that say "suspended" while it may not be read
@@ -113,6 +113,9 @@ class LiveSource {
   enum class Fold : std::uint8_t { Sum, Largest };
   /// A daily figure made of all slots that were added under its name.
   void addToFold(std::string_view name, Unit unit, Fold fold, std::uint32_t slot);
+  /// A line for the system log about what is not shown.
+  void note(std::string line) { notes_.push_back(std::move(line)); }
+  const std::vector<std::string>& notes() const { return notes_; }
   /// Publishes the folds, in the order in which they were begun. To be called last.
   void publishFolds();
 
@@ -178,6 +181,7 @@ class LiveSource {
   std::vector<FoldedSlots> folds_;
   std::vector<std::int64_t> slots_;
   std::unordered_set<std::uint64_t> ids_;
+  std::vector<std::string> notes_;
 };
 
 }  // namespace tavrel::live

@@ -59,6 +59,7 @@ struct StateTable {
   std::string times;
   std::string transitions;
   std::string current;
+  Speed currentSpeed;
   TableForm form;
   bool timeIsLast;  // behind the transitions in their own row, rather than behind the state
   Scale scale;
@@ -82,14 +83,14 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
   source.addTextFile(
       table.times, count,
       timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale));
-  residency.currentSlot = source.addNumberFile(table.current);
+  residency.currentSlot = source.addNumberFile(table.current, {}, table.currentSpeed);
   source.addStates(place, name, first, std::move(residency));
 }
 
 }  // namespace
 
 void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
-  for (const NamedDevice& cpu : devicesIn(root, kProcessors, "cpu", "", false)) {
+  for (const NamedDevice& cpu : devicesIn(root, kProcessors, "cpu", "", false, source)) {
     const std::string folder = cpu.path + "/cpuidle/state";
     std::vector<std::string> names;
     for (std::size_t i = 0; i < limits::kLiveElements; ++i) {
@@ -110,10 +111,11 @@ void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
 
 void addCpuFrequency(const DeviceRoot& root, LiveSource& source) {
   const std::string folder = std::string(kProcessors) + "/cpufreq";
-  for (const NamedDevice& policy : devicesIn(root, folder, "policy", "", false)) {
+  for (const NamedDevice& policy : devicesIn(root, folder, "policy", "", false, source)) {
     addStateTable({.times = policy.path + "/stats/time_in_state",
                    .transitions = policy.path + "/stats/trans_table",
                    .current = policy.path + "/scaling_cur_freq",
+                   .currentSpeed = Speed::Quick,
                    .form = {},
                    .timeIsLast = false,
                    .scale = kTicks,
@@ -128,10 +130,11 @@ void addCpuFrequency(const DeviceRoot& root, LiveSource& source) {
 }
 
 void addDeviceFrequency(const DeviceRoot& root, LiveSource& source) {
-  for (const NamedDevice& device : devicesIn(root, "/sys/class/devfreq", "", "", false)) {
+  for (const NamedDevice& device : devicesIn(root, "/sys/class/devfreq", "", "", false, source)) {
     addStateTable({.times = device.path + "/trans_stat",
                    .transitions = device.path + "/trans_stat",
                    .current = device.path + "/cur_freq",
+                   .currentSpeed = Speed::Quick,
                    .form = {.mark = "*"},
                    .timeIsLast = true,
                    .scale = {},
@@ -143,11 +146,12 @@ void addDeviceFrequency(const DeviceRoot& root, LiveSource& source) {
 
 void addCooling(const DeviceRoot& root, LiveSource& source) {
   for (const NamedDevice& device :
-       devicesIn(root, "/sys/class/thermal", "cooling_device", "type", false)) {
+       devicesIn(root, "/sys/class/thermal", "cooling_device", "type", false, source)) {
     const std::string stats = device.path + "/stats/";
     addStateTable({.times = stats + "time_in_state_ms",
                    .transitions = stats + "trans_table",
                    .current = device.path + "/cur_state",
+                   .currentSpeed = Speed::Slow,
                    .form = {.mark = "state"},
                    .timeIsLast = false,
                    .scale = {},

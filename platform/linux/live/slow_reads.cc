@@ -56,6 +56,7 @@ void SlowReads::work(const std::shared_ptr<Round>& round) {
       auto text = readSlowly(*file);
       lock.lock();
       file->isWaitedFor = false;
+      if (round->isOver) return;  // and its texts are no longer there
       round->texts[index] = std::move(text);
     }
     round->isDone[index] = true;

@@ -112,12 +112,10 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
     const bool isOnDisk = isLocal(device, takeField());
     if (!isRoot && !isOnDisk) continue;
     if (!seen.insert(device).second) continue;
-    const std::string name =
-        isOnDisk ? channelName(device.substr(device.rfind('/') + 1)) : "root";
-    const std::uint32_t first =
-        source.addMeasured(kFileSystemSlots, [mountPoint](std::span<std::int64_t> slots) {
-          measureFileSystem(mountPoint, slots);
-        });
+    const std::string name = isOnDisk ? channelName(device.substr(device.rfind('/') + 1)) : "root";
+    const std::uint32_t first = source.addMeasured(
+        kFileSystemSlots,
+        [mountPoint](std::span<std::int64_t> slots) { measureFileSystem(mountPoint, slots); });
     const auto add = [&](const char* figure, Unit unit, FileSystemSlot slot) {
       source.addSimple({"File Systems", name, unit}, name + figure,
                        first + static_cast<std::uint32_t>(slot));

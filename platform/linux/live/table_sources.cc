@@ -59,11 +59,11 @@ constexpr Column kInterface[] = {
 
 // Tokens of a processor's line in /proc/stat.
 constexpr Column kProcessor[] = {
-    {1, "user", kMilliseconds, kTicks},     {2, "nice", kMilliseconds, kTicks},
-    {3, "system", kMilliseconds, kTicks},   {4, "idle", kMilliseconds, kTicks},
-    {5, "iowait", kMilliseconds, kTicks},   {6, "irq", kMilliseconds, kTicks},
-    {7, "softirq", kMilliseconds, kTicks},  {8, "steal", kMilliseconds, kTicks},
-    {9, "guest", kMilliseconds, kTicks},    {10, "guest_nice", kMilliseconds, kTicks},
+    {1, "user", kMilliseconds, kTicks},    {2, "nice", kMilliseconds, kTicks},
+    {3, "system", kMilliseconds, kTicks},  {4, "idle", kMilliseconds, kTicks},
+    {5, "iowait", kMilliseconds, kTicks},  {6, "irq", kMilliseconds, kTicks},
+    {7, "softirq", kMilliseconds, kTicks}, {8, "steal", kMilliseconds, kTicks},
+    {9, "guest", kMilliseconds, kTicks},   {10, "guest_nice", kMilliseconds, kTicks},
 };
 constexpr Figure kAllProcessors[] = {
     {"cpu", 1, "cpu.user", kMilliseconds, kTicks, kItself},
@@ -144,10 +144,10 @@ constexpr Figure kGroupPressure[] = {
 };
 
 constexpr Figure kZramMemory[] = {
-    {"", 0, "zram_data", kBytes},       {"", 1, "zram_compressed", kBytes},
-    {"", 2, "zram_used", kBytes},       {"", 3, "zram_limit", kBytes},
-    {"", 4, "zram_used_max", kBytes},   {"", 5, "zram_same_pages", kPlain},
-    {"", 6, "zram_compacted", kPlain},  {"", 7, "zram_huge_pages", kPlain},
+    {"", 0, "zram_data", kBytes},      {"", 1, "zram_compressed", kBytes},
+    {"", 2, "zram_used", kBytes},      {"", 3, "zram_limit", kBytes},
+    {"", 4, "zram_used_max", kBytes},  {"", 5, "zram_same_pages", kPlain},
+    {"", 6, "zram_compacted", kPlain}, {"", 7, "zram_huge_pages", kPlain},
 };
 constexpr Figure kZramBacking[] = {
     {"", 0, "zram_backed", kPages},
@@ -215,8 +215,7 @@ void addCpuTime(const DeviceRoot& root, LiveSource& source) {
   const std::string_view path = "/proc/stat";
   addFigures(root.path(path), {.group = "CPU Time", .figures = kAllProcessors}, source);
   addDeviceTable(
-      root,
-      {.path = path, .group = "CPU Time", .form = {}, .columns = kProcessor, .prefix = "cpu"},
+      root, {.path = path, .group = "CPU Time", .form = {}, .columns = kProcessor, .prefix = "cpu"},
       source);
 }
 
@@ -242,10 +241,10 @@ void addMemory(const DeviceRoot& root, LiveSource& source) {
 void addPressure(const DeviceRoot& root, LiveSource& source) {
   for (const std::string_view resource : kResources) {
     const std::string name(resource);
-    addFigures(root.path("/proc/pressure/" + name),
-               {.group = "Pressure", .subGroup = resource, .prefix = name + '.',
-                .figures = kPressure},
-               source);
+    addFigures(
+        root.path("/proc/pressure/" + name),
+        {.group = "Pressure", .subGroup = resource, .prefix = name + '.', .figures = kPressure},
+        source);
   }
 }
 
@@ -255,7 +254,7 @@ void addSuspend(const DeviceRoot& root, LiveSource& source) {
 }
 
 void addSwapDevices(const DeviceRoot& root, LiveSource& source) {
-  for (const NamedDevice& device : devicesIn(root, "/sys/block", "zram", "", false)) {
+  for (const NamedDevice& device : devicesIn(root, "/sys/block", "zram", "", false, source)) {
     const std::string prefix = device.name + '.';
     const auto add = [&](const char* file, std::span<const Figure> figures) {
       addFigures(device.path + file,
@@ -276,7 +275,7 @@ void addSwapDevices(const DeviceRoot& root, LiveSource& source) {
 void addControlGroups(const DeviceRoot& root, LiveSource& source) {
   const bool isUnified = exists(root.path("/sys/fs/cgroup/cgroup.controllers"));
   const char* const folder = isUnified ? "/sys/fs/cgroup" : "/sys/fs/cgroup/unified";
-  for (const NamedDevice& slice : devicesIn(root, folder, "", "", false)) {
+  for (const NamedDevice& slice : devicesIn(root, folder, "", "", false, source)) {
     if (!exists(slice.path + "/cgroup.events")) continue;
     const std::string prefix = slice.name + '.';
     const std::string_view group = "Control Groups";

@@ -5,6 +5,7 @@
 #include <tuple>
 #include <unordered_set>
 
+#include "base/format.h"
 #include "base/limits.h"
 
 namespace tavrel::live {
@@ -110,13 +111,19 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   };
   std::vector<Row> rows;
   std::unordered_set<std::string> seen;
+  bool isCut = false;
   forEachRow(*text, table.form, [&](std::string_view key, std::size_t tokens) {
-    if (rows.size() == limits::kLiveRows || !key.starts_with(table.prefix)) return;
+    if (!key.starts_with(table.prefix)) return;
+    if (rows.size() == limits::kLiveRows) {
+      isCut = true;
+      return;
+    }
     if (!table.prefix.empty() && key == table.prefix) return;  // the sum of all
     std::string name(key);
     if (!table.only.empty() && !allowed.contains(name)) return;
     if (seen.insert(name).second) rows.push_back({std::move(name), tokens});
   });
+  if (isCut) source.note(format("%s: only the first %zu rows are shown", path, rows.size()));
   std::vector<Cell> cells;
   for (const Column& column : table.columns)
     cells.push_back({column.token, static_cast<std::uint32_t>(cells.size()), column.scale});
@@ -124,9 +131,8 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   auto reader = std::make_unique<TableReader>(table.form, std::move(cells));
   for (std::size_t i = 0; i < rows.size(); ++i)
     reader->addRow(rows[i].key, static_cast<std::uint32_t>(i) * width);
-  std::uint32_t slot = source.addTextFile(std::move(path),
-                                          static_cast<std::uint32_t>(rows.size()) * width,
-                                          std::move(reader));
+  std::uint32_t slot = source.addTextFile(
+      std::move(path), static_cast<std::uint32_t>(rows.size()) * width, std::move(reader));
   for (const Row& row : rows) {
     const std::string device = channelName(row.key);
     const bool isDaily = !table.daily.empty() &&
@@ -147,9 +153,8 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
   if (!text) return;
   const bool isKeyless = list.form.key == TableForm::kNoKey;
   std::unordered_map<std::string, std::size_t> tokens;
-  forEachRow(*text, list.form, [&](std::string_view key, std::size_t count) {
-    tokens.emplace(key, count);
-  });
+  forEachRow(*text, list.form,
+             [&](std::string_view key, std::size_t count) { tokens.emplace(key, count); });
   // The rows may have different figures, so each token that is listed has a column.
   std::vector<std::pair<std::size_t, Scale>> columns;
   for (const Figure& figure : list.figures)
@@ -177,8 +182,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
     if (isNew) reader->addRow(row->first, at->second);
     const auto column = std::lower_bound(columns.begin(), columns.end(),
                                          std::pair(figure.token, figure.scale), before);
-    found.emplace_back(&figure,
-                       at->second + static_cast<std::uint32_t>(column - columns.begin()));
+    found.emplace_back(&figure, at->second + static_cast<std::uint32_t>(column - columns.begin()));
   }
   if (found.empty()) return;
   const std::uint32_t first = source.addTextFile(

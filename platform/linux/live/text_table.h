@@ -40,8 +40,7 @@ struct Cell {
 /// Reads rows that are known by their keys; figures of rows that share slots add up.
 class TableReader final : public TextReader {
  public:
-  TableReader(TableForm form, std::vector<Cell> cells)
-      : form_(form), cells_(std::move(cells)) {}
+  TableReader(TableForm form, std::vector<Cell> cells) : form_(form), cells_(std::move(cells)) {}
 
   void addRow(std::string key, std::uint32_t firstSlot);
   void read(std::string_view text, std::span<std::int64_t> slots) const override;

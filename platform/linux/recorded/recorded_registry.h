@@ -22,8 +22,8 @@ namespace tavrel {
 
 class RecordedRegistry final : public DriverRegistry {
  public:
-  /// Reads the folder on the first request for a service, and later reads changed files again. Shows
-  /// live services, where given, beside the recorded ones; they must outlive it.
+  /// Reads the folder on the first request for a service, and later reads changed files again.
+  /// Shows live services, where given, beside the recorded ones; they must outlive it.
   RecordedRegistry(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
                    SystemLog& log, LiveServices* live = nullptr);
   /// Plays one recording, in the form that a file of the folder has. The dictionary is shared, so

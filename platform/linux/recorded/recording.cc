@@ -12,9 +12,6 @@ namespace {
 
 using Form = RecordedField::Form;
 
-// Of the hub when no recording has one, which then is there for the live services.
-constexpr std::int64_t kLiveHubID = 0x4c69'7665'4875'62;
-
 constexpr RecordedField kPartFields[] = {
     {"Services", Form::Array}, {"Hub", Form::Dictionary}, {"Generation", Form::Integer}};
 constexpr RecordedField kServiceFields[] = {

@@ -28,6 +28,9 @@ struct RecordingPart {
   plist::Dictionary content;
 };
 
+/// Entry id of the hub that is there for live services when no recording has one.
+inline constexpr std::int64_t kLiveHubID = 0x4c69'7665'4875'62;
+
 struct RecordedEntry {
   plist::Dictionary record;
   std::string className;
