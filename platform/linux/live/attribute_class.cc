@@ -16,7 +16,7 @@ std::string withNumber(std::string_view pattern, std::string_view number) {
 }
 
 // The first line of the file; nothing when there is none.
-std::string lineOf(const std::string& path, std::vector<char>& buffer) {
+std::string lineOf(const std::string& path, TextBuffer& buffer) {
   auto text = readKernelFile(path, ReadMode::Once, buffer);
   return text ? std::string(takeLine(*text)) : std::string();
 }
@@ -52,7 +52,7 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
   std::vector<NamedDevice> devices;
   std::vector<std::string> entries;
   std::unordered_map<std::string, std::size_t> counts;
-  std::vector<char> buffer;
+  TextBuffer buffer;
   for (std::string& name : namesIn(base)) {
     if (!name.starts_with(entry)) continue;
     if (devices.size() == limits::kLiveDevices) {

@@ -95,7 +95,7 @@ class InterruptReader final : public TextReader {
 
 void addCounts(const std::string& path, const std::string& prefix, std::string_view group,
                LiveSource& source) {
-  std::vector<char> buffer;
+  TextBuffer buffer;
   auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   if (!text) return;
   const std::vector<std::uint32_t> processors = processorsIn(takeLine(*text));

@@ -13,7 +13,8 @@
 namespace tavrel::live {
 namespace {
 
-constexpr std::size_t kPartBytes = 64U << 10;
+constexpr std::size_t kFirstBytes = 16U << 10;
+constexpr std::size_t kLeastRoom = 4096;  // the kernel gives no more of an attribute
 constexpr std::size_t kFallbackDescriptors = 256;
 
 Descriptor openFile(const std::string& path) {
@@ -21,21 +22,31 @@ Descriptor openFile(const std::string& path) {
   return Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
 }
 
-std::optional<std::string_view> readOpen(int descriptor, ReadMode mode, std::vector<char>& buffer) {
+std::optional<std::string_view> readOpen(int descriptor, ReadMode mode, TextBuffer& buffer) {
   std::size_t length = 0;
   while (length < limits::kLiveFileBytes) {
-    if (buffer.size() < length + kPartBytes) buffer.resize(length + kPartBytes);
-    const ssize_t count = pread(descriptor, buffer.data() + length, buffer.size() - length,
-                                static_cast<off_t>(length));
+    const std::span<char> room = buffer.roomBehind(length);
+    const ssize_t count = pread(descriptor, room.data(), room.size(), static_cast<off_t>(length));
     if (count < 0 && errno == EINTR) continue;
     if (count < 0) return std::nullopt;
     length += static_cast<std::size_t>(count);
     if (count == 0 || mode == ReadMode::Once) break;
   }
-  return std::string_view(buffer.data(), length);
+  return buffer.text(length);
 }
 
 }  // namespace
+
+std::span<char> TextBuffer::roomBehind(std::size_t length) {
+  if (size_ < length + kLeastRoom) {
+    const std::size_t size = std::max(kFirstBytes, 2 * size_);
+    auto bytes = std::make_unique_for_overwrite<char[]>(size);
+    std::copy_n(bytes_.get(), length, bytes.get());
+    bytes_ = std::move(bytes);
+    size_ = size;
+  }
+  return {bytes_.get() + length, size_ - length};
+}
 
 DescriptorBudget::DescriptorBudget() : left_(kFallbackDescriptors) {
   rlimit limit{};
@@ -45,14 +56,13 @@ DescriptorBudget::DescriptorBudget() : left_(kFallbackDescriptors) {
 }
 
 std::optional<std::string_view> readKernelFile(const std::string& path, ReadMode mode,
-                                               std::vector<char>& buffer) {
+                                               TextBuffer& buffer) {
   const Descriptor descriptor = openFile(path);
   if (!descriptor) return std::nullopt;
   return readOpen(descriptor.get(), mode, buffer);
 }
 
-std::optional<std::string_view> KernelFile::read(DescriptorBudget& budget,
-                                                 std::vector<char>& buffer) {
+std::optional<std::string_view> KernelFile::read(DescriptorBudget& budget, TextBuffer& buffer) {
   if (descriptor_) {
     const auto text = readOpen(descriptor_.get(), mode_, buffer);
     // The file of a device that is gone fails; one of that name may belong to the next device.

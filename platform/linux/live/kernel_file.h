@@ -2,7 +2,9 @@
 #pragma once
 
 #include <cstddef>
+#include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -27,10 +29,22 @@ enum class ReadMode : std::uint8_t {
   ToEnd,  // a text that may come in parts
 };
 
+/// Room for the text of one file at a time. It grows, and is not cleared.
+class TextBuffer {
+ public:
+  /// Room for more text behind the first `length` bytes, which stay.
+  std::span<char> roomBehind(std::size_t length);
+  std::string_view text(std::size_t length) const { return {bytes_.get(), length}; }
+
+ private:
+  std::unique_ptr<char[]> bytes_;
+  std::size_t size_ = 0;
+};
+
 /// Reads a whole file of the kernel into `buffer`, at most `limits::kLiveFileBytes`. Nothing when
 /// it cannot be opened or read. Opening does not wait for anybody.
 std::optional<std::string_view> readKernelFile(const std::string& path, ReadMode mode,
-                                               std::vector<char>& buffer);
+                                               TextBuffer& buffer);
 
 class KernelFile {
  public:
@@ -40,7 +54,7 @@ class KernelFile {
 
   /// The text as it is now, in `buffer`. Reads through the descriptor of the reading before when
   /// the budget had one; a file that has meanwhile been made anew is opened again.
-  std::optional<std::string_view> read(DescriptorBudget& budget, std::vector<char>& buffer);
+  std::optional<std::string_view> read(DescriptorBudget& budget, TextBuffer& buffer);
 
  private:
   std::string path_;

@@ -169,8 +169,8 @@ class LiveMachine::State {
   std::unordered_map<ChannelKey, ChannelPlace, ChannelKeyHash> index_;
   std::unordered_map<ChannelKey, std::shared_ptr<SlowFile>, ChannelKeyHash> slowFiles_;
   DescriptorBudget budget_;
-  std::vector<char> buffer_;
-  std::vector<char> statusBuffer_;
+  TextBuffer buffer_;
+  TextBuffer statusBuffer_;
   SlowReads slowReads_;
 };
 

@@ -16,14 +16,14 @@ constexpr std::string_view kProcessors = "/sys/devices/system/cpu";
 constexpr Scale kTicks{10, 1};  // of 10 ms
 
 std::string lineOf(const std::string& path) {
-  std::vector<char> buffer;
+  TextBuffer buffer;
   auto text = readKernelFile(path, ReadMode::Once, buffer);
   return text ? std::string(takeLine(*text)) : std::string();
 }
 
 // The keys of the rows that begin with a number, in their order.
 std::vector<std::string> numberedRows(const std::string& path, const TableForm& form) {
-  std::vector<char> buffer;
+  TextBuffer buffer;
   auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   std::vector<std::string> keys;
   while (text && !text->empty() && keys.size() < limits::kLiveElements) {

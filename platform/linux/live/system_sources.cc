@@ -96,7 +96,7 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
   struct statfs status {};
   if (statfs(root.path("/proc").c_str(), &status) != 0) return;
   if (status.f_type != PROC_SUPER_MAGIC) return;
-  std::vector<char> buffer;
+  TextBuffer buffer;
   auto text = readKernelFile(root.path("/proc/self/mounts"), ReadMode::ToEnd, buffer);
   std::unordered_set<std::string> seen;
   while (text && !text->empty() && seen.size() < limits::kLiveDevices) {

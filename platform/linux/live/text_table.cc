@@ -94,7 +94,7 @@ void TableReader::read(std::string_view text, std::span<std::int64_t> slots) con
 }
 
 void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource& source) {
-  std::vector<char> buffer;
+  TextBuffer buffer;
   std::string path = root.path(table.path);
   const auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   if (!text) return;
@@ -148,7 +148,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
 }
 
 void addFigures(const std::string& path, const FigureList& list, LiveSource& source) {
-  std::vector<char> buffer;
+  TextBuffer buffer;
   const auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   if (!text) return;
   const bool isKeyless = list.form.key == TableForm::kNoKey;
