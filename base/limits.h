@@ -155,4 +155,27 @@ inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 /// system's own list of all locales has some 500.
 inline constexpr std::size_t kLanguages = 1'000;
 
+/// Bytes of a text of the kernel. The longest, /proc/interrupts of a machine with many processors,
+/// stays below.
+inline constexpr std::size_t kLiveFileBytes = 4U << 20;
+
+/// Elements of a live channel. An element has room for the counts of four processors, or for one
+/// state; a type counts up to 65,535.
+inline constexpr std::size_t kLiveElements = 4096;
+
+/// Devices of one kind that are shown live, in the order of their names. Each costs a few files
+/// that are read one by one.
+inline constexpr std::size_t kLiveDevices = 1000;
+
+/// Rows of one table of the kernel that are shown live, such as its network interfaces.
+inline constexpr std::size_t kLiveRows = 20'000;
+
+/// How long a sensor may take to answer, and all sensors together, in milliseconds. Buses with one
+/// wire take up to a second for each.
+inline constexpr int kSensorMilliseconds = 1'000;
+inline constexpr int kSensorsMilliseconds = 4'000;
+
+/// Sensors that may keep a thread waiting at one time. Each of them costs the stack of a thread.
+inline constexpr int kWaitingSensors = 4;
+
 }  // namespace tavrel::limits

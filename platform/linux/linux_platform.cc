@@ -13,6 +13,7 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/folding_store.h"
 #include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/live/live_machine.h"
 #include "platform/linux/locale/linux_date_formatting.h"
 #include "platform/linux/locale/linux_locale.h"
 #include "platform/linux/logs/file_crash_reporting.h"
@@ -72,7 +73,8 @@ struct LinuxPlatform::Services {
   LinuxDateFormatting dateFormatting{root};
   LinuxProcess process;
   LinuxStandardStreams standardStreams{systemLog};
-  RecordedRegistry drivers{root, fileSystem, propertyLists, log};
+  LiveMachine live{root, log};
+  RecordedRegistry drivers{root, fileSystem, propertyLists, log, &live};
   RecordedSnapshots stackSnapshots{root, fileSystem, log};
   ProcessState state;
 
