@@ -13,6 +13,8 @@ LIMITS = {
     "1,000 distributions, ms": 20.0,
     "report sample of 10,000 channels, ms": 100.0,
     "report sample of 10,000 channels, MiB": 64.0,
+    "24 folds: ratio to the content": 5.0,
+    "24 folds of 7 values a second, MB": 22.0,
     "service: memory when idle, MiB": 8.0,
     "service: delivery to log, wall ms": 50.0,
 }

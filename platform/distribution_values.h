@@ -5,10 +5,10 @@
 // the day, little-endian. They are adjacent, in the order of recording, at any alignment.
 #pragma once
 
-#include <array>
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string>
 #include <string_view>
 
@@ -30,16 +30,21 @@ struct DistributionBlock {
   std::string_view offsets;
 };
 
-inline void appendPackedValue(std::string& values, double value) {
-  std::array<std::byte, kPackedValueBytes> bytes;
-  storeLittle64(bytes, 0, std::bit_cast<std::uint64_t>(value));
-  values += asText(bytes);
-}
-
-inline void appendPackedOffset(std::string& offsets, std::uint32_t secondsInDayOffset) {
-  std::array<std::byte, kPackedOffsetBytes> bytes;
-  storeLittle32(bytes, 0, secondsInDayOffset);
-  offsets += asText(bytes);
+/// Appends to packed values and to their packed offsets.
+inline void appendPacked(std::string& values, std::string& offsets,
+                         std::span<const DistributionSample> samples) {
+  std::size_t value = values.size();
+  std::size_t offset = offsets.size();
+  values.resize(value + samples.size() * kPackedValueBytes);
+  offsets.resize(offset + samples.size() * kPackedOffsetBytes);
+  const MutableByteSpan valueBytes = std::as_writable_bytes(std::span(values));
+  const MutableByteSpan offsetBytes = std::as_writable_bytes(std::span(offsets));
+  for (const DistributionSample& sample : samples) {
+    storeLittle64(valueBytes, value, std::bit_cast<std::uint64_t>(sample.value));
+    storeLittle32(offsetBytes, offset, sample.secondsInDayOffset);
+    value += kPackedValueBytes;
+    offset += kPackedOffsetBytes;
+  }
 }
 
 /// The value whose bytes begin at `value`.

@@ -73,8 +73,7 @@ struct FakePreferences : Preferences {
 struct FakeDistribution : BHHistoryDistributionEnumerator {
   explicit FakeDistribution(const std::vector<double>& values) {
     for (const double value : values)
-      appendPackedValue(packed, value);
-    offsets.resize(values.size() * kPackedOffsetBytes);
+      appendPacked(packed, offsets, {{{value, 0}}});
   }
   std::string packed, offsets;
   bool wasRead = false;

@@ -252,9 +252,9 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
         "", kToday, kToday, [&](auto key, auto, auto count, auto& values, auto&) {
           std::map<std::string, int> seen;
           for (const Sample& sample : take(values)) {
-            std::string letters;
-            appendPackedValue(letters, sample.value);
-            appendPackedOffset(letters, sample.secondsInDayOffset);
+            std::string letters, offset;
+            appendPacked(letters, offset, {{sample}});
+            letters += offset;
             ++seen[letters];
           }
           lines.push_back(std::string(key) + " " + std::to_string(count));

@@ -191,34 +191,23 @@ Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64
 
 Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
                                 std::uint32_t secondsInDayOffset, double value) {
-  try {
-    PendingSeries& series = pendingSeries({day, key});
-    appendPackedValue(series.values, value);
-    appendPackedOffset(series.offsets, secondsInDayOffset);
-    pendingBytes_ += kPackedValueBytes + kPackedOffsetBytes;
-    if (pendingBytes_ >= kPendingBytes) writeDistributions();
-  } catch (const StoreFailure& failure) {
-    return describe(failure);
-  }
-  return Done{};
+  const DistributionSample sample{value, secondsInDayOffset};
+  return appendValues(day, key, {&sample, 1});
 }
 
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
+  // As many as wait at most, so that a large span is no exception.
+  constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
   try {
-    PendingSeries& series = pendingSeries({day, key});
-    const std::size_t held = series.offsets.size() / kPackedOffsetBytes;
-    series.values.resize((held + samples.size()) * kPackedValueBytes);
-    series.offsets.resize((held + samples.size()) * kPackedOffsetBytes);
-    const MutableByteSpan values = std::as_writable_bytes(std::span(series.values));
-    const MutableByteSpan offsets = std::as_writable_bytes(std::span(series.offsets));
-    for (std::size_t i = 0; i < samples.size(); ++i) {
-      storeLittle64(values, (held + i) * kPackedValueBytes,
-                    std::bit_cast<std::uint64_t>(samples[i].value));
-      storeLittle32(offsets, (held + i) * kPackedOffsetBytes, samples[i].secondsInDayOffset);
+    while (!samples.empty()) {
+      const auto taken = samples.first(std::min(samples.size(), kPendingBytes / kSampleBytes));
+      PendingSeries& series = pendingSeries({day, key});
+      appendPacked(series.values, series.offsets, taken);
+      pendingBytes_ += taken.size() * kSampleBytes;
+      if (pendingBytes_ >= kPendingBytes) writeDistributions();
+      samples = samples.subspan(taken.size());
     }
-    pendingBytes_ += samples.size() * (kPackedValueBytes + kPackedOffsetBytes);
-    if (pendingBytes_ >= kPendingBytes) writeDistributions();
   } catch (const StoreFailure& failure) {
     return describe(failure);
   }

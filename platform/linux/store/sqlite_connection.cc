@@ -9,7 +9,7 @@
 #include <unistd.h>
 #include <utility>
 
-#include "platform/linux/store/sqlite_file_methods.h"
+#include "platform/linux/store/sqlite_index_room.h"
 #include "platform/linux/store/sqlite_library.h"
 
 namespace tavrel {
@@ -158,7 +158,7 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
   const int code = sqlite().open_v2(name.c_str(), &handle_, flags, nullptr);
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
-    methods_ = std::make_unique<FileMethods>(handle_, access != Access::Create);
+    indexRoom_ = std::make_unique<IndexRoom>(handle_);
     sqlite().busy_handler(handle_, waitForLock, busy_.get());
     // The file may come from anywhere, so nothing in its schema may run.
     sqlite().db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
@@ -182,12 +182,12 @@ SqliteConnection::~SqliteConnection() {
 SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
     : handle_(std::exchange(other.handle_, nullptr)),
       busy_(std::move(other.busy_)),
-      methods_(std::move(other.methods_)) {}
+      indexRoom_(std::move(other.indexRoom_)) {}
 
 SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
   std::swap(handle_, other.handle_);
   std::swap(busy_, other.busy_);
-  std::swap(methods_, other.methods_);
+  std::swap(indexRoom_, other.indexRoom_);
   return *this;
 }
 

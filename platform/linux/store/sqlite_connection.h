@@ -22,7 +22,7 @@ struct sqlite3_stmt;
 
 namespace tavrel {
 
-class FileMethods;
+class IndexRoom;
 
 enum class StoreFault : std::uint8_t {
   Damaged,  // SQLite finds the file corrupt, or not a database
@@ -88,7 +88,7 @@ class SqliteConnection {
  private:
   sqlite3* handle_ = nullptr;
   std::shared_ptr<BusyBudget> busy_;
-  std::unique_ptr<FileMethods> methods_;
+  std::unique_ptr<IndexRoom> indexRoom_;
 };
 
 class SqliteStatement {

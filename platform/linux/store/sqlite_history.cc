@@ -187,7 +187,15 @@ void SqliteHistory::readUnchanged(Read read) {
   if (!store_) return;
   try {
     version_ = schemaVersion(store_->connection);
-    read();
+    try {
+      read();
+    } catch (const StoreFailure& failure) {
+      // A writer may have converted the store since. The query has then not given any row yet.
+      if (failure.fault != StoreFault::Foreign) throw;
+      const auto before = std::exchange(version_, schemaVersion(store_->connection));
+      if (version_ == before) throw;
+      read();
+    }
   } catch (const StoreFailure&) {
     checkUnchanged();
     throw;

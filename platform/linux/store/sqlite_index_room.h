@@ -1,0 +1,33 @@
+// Room for the index of SQLite's write-ahead log.
+//
+// SQLite maps the index, the "-shm" file, and writes into the mapping. It extends the file by
+// writing one byte per page of 4 KiB, which leaves holes on a file system with smaller blocks. On a
+// full disk, a write into a hole raises SIGBUS. An `IndexRoom` has every page of the index
+// allocated before SQLite sees it. Without enough room, writers and readers then get SQLITE_FULL.
+#pragma once
+
+#include <sqlite3.h>
+
+namespace tavrel {
+
+class IndexRoom {
+ public:
+  /// Intercepts the calls of the connection, which must not have run a statement yet, on its file.
+  /// Must outlive the connection.
+  explicit IndexRoom(sqlite3* connection);
+  IndexRoom(const IndexRoom&) = delete;
+  IndexRoom& operator=(const IndexRoom&) = delete;
+
+ private:
+  // SQLite calls this instead of the file's own methods. It is the first member: the address that
+  // SQLite has leads back to the other members.
+  struct Methods {
+    sqlite3_io_methods replaced;
+    const sqlite3_io_methods* own;
+  };
+  static int mapIndex(sqlite3_file* file, int region, int bytes, int extends, void volatile** at);
+
+  Methods methods_{};
+};
+
+}  // namespace tavrel
