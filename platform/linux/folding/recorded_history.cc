@@ -41,7 +41,7 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
         DistributionSample sample;
         while (values_.size() < kAtOnce * kPackedValueBytes &&
                stored_->getNextValue(sample.value, sample.secondsInDayOffset)) {
-          append(sample);
+          appendPacked(values_, offsets_, std::span(&sample, 1));
         }
         if (!values_.empty()) return {values_, offsets_};
       } else if (const std::string_view values = stored_->nextValues(); !values.empty()) {
@@ -56,14 +56,8 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
     std::array<DistributionSample, kAtOnce> samples;
     const std::size_t count = waiting_.readSeries(series_, at_, samples);
     at_ += count;
-    for (std::size_t i = 0; i < count; ++i)
-      append(samples[i]);
+    appendPacked(values_, offsets_, std::span(samples).first(count));
     return {values_, offsets_};
-  }
-
-  void append(const DistributionSample& sample) {
-    appendPackedValue(values_, sample.value);
-    appendPackedOffset(offsets_, sample.secondsInDayOffset);
   }
 
   BHHistoryDistributionEnumerator* stored_;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <string_view>
 #include <unistd.h>
 
 #include "base/utf8.h"
@@ -71,16 +72,15 @@ SegmentFile::Key SegmentFile::readKey(std::uint32_t number) const {
   return key;
 }
 
-std::optional<std::string_view> SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
-  if (number == 0 || number > kBHKeys) return std::nullopt;
+const std::string* SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
+  if (number == 0 || number > kBHKeys) return nullptr;
   if (keys_.empty()) keys_.resize(kBHKeys + 1);
   Key& key = keys_[number];
   if (!key.isRead) {
     key = readKey(number);
     key.isRead = true;
   }
-  if (key.kind != kind) return std::nullopt;
-  return key.name;
+  return key.kind == kind ? &key.name : nullptr;
 }
 
 }  // namespace tavrel

@@ -3,9 +3,7 @@
 
 #include <array>
 #include <cstdint>
-#include <optional>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "base/bytes.h"
@@ -33,9 +31,9 @@ class SegmentFile {
 
   SegmentFacts facts() const;
 
-  /// The name of the key with this number; nothing when there is no valid one of this kind. It
-  /// stays in place as long as this object lives.
-  std::optional<std::string_view> key(std::uint32_t number, std::uint8_t kind);
+  /// The name of the key with this number; null when there is no valid one of this kind. It stays
+  /// in place as long as this object lives.
+  const std::string* key(std::uint32_t number, std::uint8_t kind);
 
  private:
   struct Key {

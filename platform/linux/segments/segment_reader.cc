@@ -213,9 +213,9 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   const bool isSet = now.sets != folded.sets;
   const std::int64_t value = isSet ? now.value : wrappingSubtract(now.value, folded.value);
   if (isSet || value != 0) {
-    const auto key = file_.key(before.key, kBHKindScalar);
+    const std::string* const key = file_.key(before.key, kBHKindScalar);
     const auto instant = dayAndSecond(secondsOf(before.start, reading.boot));
-    if (key && instant && (isUndated(before.start) || instant->secondsInDay == 0)) {
+    if (key != nullptr && instant && (isUndated(before.start) || instant->secondsInDay == 0)) {
       const std::int64_t time = isSet ? nanosecondsOf(now.setTime, reading.boot) : 0;
       reading.sink.takeScalar({*key, instant->day, isSet, value, time});
     } else {
@@ -269,8 +269,8 @@ void SegmentReader::readChunk(Reading& reading, std::uint32_t index) {
       if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
       const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
       const auto number = static_cast<std::uint32_t>(mark & 0xffff);
-      const auto key = file_.key(number, kBHKindDistribution);
-      if (!key || !days.find(secondsOf(time, reading.boot))) {
+      const std::string* const key = file_.key(number, kBHKindDistribution);
+      if (key == nullptr || !days.find(secondsOf(time, reading.boot))) {
         ++reading.progress.refused;
         continue;
       }
