@@ -35,27 +35,36 @@ constexpr const char* kFiles[] = {
     "/sys/power/suspend_stats/success",
 };
 
-std::string makeRoot() {
-  std::string name = "/dev/shm/live-fuzz-XXXXXX";
-  if (!mkdtemp(name.data())) std::abort();
-  for (const char* const file : kFiles)
-    std::filesystem::create_directories(std::filesystem::path(name + file).parent_path());
-  std::ofstream(name + "/sys/class/hwmon/hwmon0/in0_label") << "x";
-  std::ofstream(name + "/sys/class/thermal/cooling_device0/stats/time_in_state_ms")
-      << "state0\t1\nstate1\t2\n";
-  return name;
-}
+class Tree {
+ public:
+  Tree() {
+    if (!mkdtemp(folder_.data())) std::abort();
+    for (const char* const file : kFiles)
+      std::filesystem::create_directories(std::filesystem::path(folder_ + file).parent_path());
+    std::ofstream(folder_ + "/sys/class/hwmon/hwmon0/in0_input") << "1";
+    std::ofstream(folder_ + "/sys/class/thermal/cooling_device0/stats/time_in_state_ms")
+        << "state0\t1\nstate1\t2\n";
+  }
+  ~Tree() { std::filesystem::remove_all(folder_); }
+  Tree(const Tree&) = delete;
+  Tree& operator=(const Tree&) = delete;
+
+  const std::string& folder() const { return folder_; }
+
+ private:
+  std::string folder_ = "/dev/shm/live-fuzz-XXXXXX";
+};
 
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  static const std::string folder = makeRoot();
+  static const Tree tree;
   if (size == 0) return 0;
   const std::string text(reinterpret_cast<const char*>(data) + 1, size - 1);
-  const std::string path = folder + kFiles[data[0] % std::size(kFiles)];
+  const std::string path = tree.folder() + kFiles[data[0] % std::size(kFiles)];
   std::ofstream(path) << text;
 
-  const DeviceRoot root(folder);
+  const DeviceRoot root(tree.folder());
   Silent log;
   LiveMachine machine(root, log);
   const auto sampling = machine.subscribe();

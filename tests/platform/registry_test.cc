@@ -524,5 +524,20 @@ TEST_F(RecordingFolderTest, IsOneRecordingThatPlaysTheSame) {
   EXPECT_EQ(log.lines, Lines{});
 }
 
+TEST(RecordedHubTest, AChannelMayBeAbsentFromAnUpdate) {
+  KeptLog log;
+  const Data absent{ByteSpan()};
+  RecordedRegistry registry(
+      hub({hubChannel(1, 1, Array{absent, group(1, 1, 1, 7), absent}),
+           hubChannel(1, 2, group(1, 2, 1, 8)), hubChannel(1, 3, Array{absent})}),
+      log);
+  Client client(registry);
+  ASSERT_EQ(client.subscribe(interests(2, {{1, 1}, {1, 2}})), kKernelSuccess);
+  EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
+  EXPECT_EQ(client.update(), "1/1*1=7 1/2*1=8 ");
+  EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
+  EXPECT_EQ(log.lines.size(), 1U);  // nothing but absences is no sequence
+}
+
 }  // namespace
 }  // namespace tavrel

@@ -248,5 +248,19 @@ TEST(LiveTest, RecordsWhatIsLive) {
                fails("--seconds is for --live: recordings are written as they stand", 2));
 }
 
+// Every daily figure of this machine is in the example, which has nothing to complain about.
+TEST(LiveTest, TheExampleListsTheDailyFigures) {
+  const std::string file = TAVREL_EXAMPLES "/whitelist-live.plist";
+  EXPECT_EQ(TemporaryDevice::runAt("/", "whitelist check " + file).status, 0);
+  const Outcome list = TemporaryDevice::runAt("/", "report list --live --category 0x100 --json");
+  const auto json = nlohmann::json::parse(list.out);
+  EXPECT_GE(json["channels"].size(), 10U);
+  const std::string whitelist = contentOf(file);
+  for (const auto& channel : json["channels"]) {
+    const std::string key = "<key>com.norvane.ioreport." + channel["name"].get<std::string>() + '<';
+    EXPECT_NE(whitelist.find(key), std::string::npos) << key;
+  }
+}
+
 }  // namespace
 }  // namespace tavrel

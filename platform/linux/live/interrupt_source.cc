@@ -123,8 +123,8 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
     if (isNew) names.emplace_back(name, at->second);
     reader->addRow(std::move(key), at->second);
   }
-  const std::uint32_t first =
-      source.addTextFile(path, static_cast<std::uint32_t>(names.size()) * width, std::move(reader));
+  const std::uint32_t first = source.addTextFile(
+      path, static_cast<std::uint32_t>(names.size()) * width, std::move(reader), ReadMode::ToEnd);
   for (auto& [name, slot] : names)
     source.addArray({"Interrupts", group, kEvents}, std::move(name), first + slot, width);
 }

@@ -30,7 +30,8 @@ std::optional<std::string_view> readOpen(int descriptor, ReadMode mode, TextBuff
     if (count < 0 && errno == EINTR) continue;
     if (count < 0) return std::nullopt;
     length += static_cast<std::size_t>(count);
-    if (count == 0 || mode == ReadMode::Once) break;
+    const bool isCut = static_cast<std::size_t>(count) == room.size();
+    if (count == 0 || (mode == ReadMode::Once && !isCut)) break;
   }
   return buffer.text(length);
 }

@@ -25,8 +25,8 @@ class DescriptorBudget {
 };
 
 enum class ReadMode : std::uint8_t {
-  Once,   // an attribute, which the kernel shows whole in one reading
-  ToEnd,  // a text that may come in parts
+  Once,   // a text that the kernel gives whole when there is room for it
+  ToEnd,  // one that comes in parts
 };
 
 /// Room for the text of one file at a time. It grows, and is not cleared.

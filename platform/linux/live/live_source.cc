@@ -27,10 +27,9 @@ std::uint32_t LiveSource::addNumberFile(std::string path, Scale scale, Speed spe
 }
 
 std::uint32_t LiveSource::addTextFile(std::string path, std::uint32_t slots,
-                                      std::unique_ptr<const TextReader> reader) {
+                                      std::unique_ptr<const TextReader> reader, ReadMode mode) {
   const std::uint32_t first = addSlots(slots);
-  files_.push_back(
-      {KernelFile(std::move(path), ReadMode::ToEnd), first, slots, {}, std::move(reader)});
+  files_.push_back({KernelFile(std::move(path), mode), first, slots, {}, std::move(reader)});
   return first;
 }
 

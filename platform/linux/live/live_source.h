@@ -98,7 +98,7 @@ class LiveSource {
                               std::vector<std::string> powerStatus = {});
   /// A file whose text the reader takes apart into so many slots.
   std::uint32_t addTextFile(std::string path, std::uint32_t slots,
-                            std::unique_ptr<const TextReader> reader);
+                            std::unique_ptr<const TextReader> reader, ReadMode mode);
   /// A value that a file system or the process itself tells.
   std::uint32_t addMeasured(std::uint32_t slots,
                             std::function<void(std::span<std::int64_t>)> measure);

@@ -24,7 +24,7 @@ std::string lineOf(const std::string& path) {
 // The keys of the rows that begin with a number, in their order.
 std::vector<std::string> numberedRows(const std::string& path, const TableForm& form) {
   TextBuffer buffer;
-  auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
+  auto text = readKernelFile(path, ReadMode::Once, buffer);
   std::vector<std::string> keys;
   while (text && !text->empty() && keys.size() < limits::kLiveElements) {
     std::string_view line = takeLine(*text);
@@ -78,11 +78,12 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
   }
   residency.ids = stateIDs(names);
   const auto count = static_cast<std::uint32_t>(states.size());
-  const std::uint32_t first =
-      source.addTextFile(table.transitions, count, transitionReader(states, table.form));
+  const std::uint32_t first = source.addTextFile(
+      table.transitions, count, transitionReader(states, table.form), ReadMode::Once);
   source.addTextFile(
       table.times, count,
-      timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale));
+      timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale),
+      ReadMode::Once);
   residency.currentSlot = source.addNumberFile(table.current, {}, table.currentSpeed);
   source.addStates(place, name, first, std::move(residency));
 }

@@ -234,7 +234,8 @@ void addMemory(const DeviceRoot& root, LiveSource& source) {
   for (Figure& figure : figures) {
     if (figure.scale.multiply == 0) figure.scale.multiply = sysconf(_SC_PAGESIZE);
   }
-  addFigures(root.path("/proc/vmstat"), {.group = "Memory", .figures = figures}, source);
+  addFigures(root.path("/proc/vmstat"),
+             {.group = "Memory", .figures = figures, .mode = ReadMode::ToEnd}, source);
   addFigures(root.path("/proc/meminfo"), {.group = "Memory Use", .figures = kMemoryUse}, source);
 }
 

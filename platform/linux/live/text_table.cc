@@ -131,8 +131,9 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   auto reader = std::make_unique<TableReader>(table.form, std::move(cells));
   for (std::size_t i = 0; i < rows.size(); ++i)
     reader->addRow(rows[i].key, static_cast<std::uint32_t>(i) * width);
-  std::uint32_t slot = source.addTextFile(
-      std::move(path), static_cast<std::uint32_t>(rows.size()) * width, std::move(reader));
+  std::uint32_t slot =
+      source.addTextFile(std::move(path), static_cast<std::uint32_t>(rows.size()) * width,
+                         std::move(reader), ReadMode::ToEnd);
   for (const Row& row : rows) {
     const std::string device = channelName(row.key);
     const bool isDaily = !table.daily.empty() &&
@@ -149,7 +150,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
 
 void addFigures(const std::string& path, const FigureList& list, LiveSource& source) {
   TextBuffer buffer;
-  const auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
+  const auto text = readKernelFile(path, list.mode, buffer);
   if (!text) return;
   const bool isKeyless = list.form.key == TableForm::kNoKey;
   std::unordered_map<std::string, std::size_t> tokens;
@@ -186,7 +187,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
   }
   if (found.empty()) return;
   const std::uint32_t first = source.addTextFile(
-      path, static_cast<std::uint32_t>(firstSlots.size()) * width, std::move(reader));
+      path, static_cast<std::uint32_t>(firstSlots.size()) * width, std::move(reader), list.mode);
   for (const auto& [figure, slot] : found) {
     publish({list.group, list.subGroup, figure->unit},
             std::string(list.prefix) + std::string(figure->name), first + slot, figure->daily,

@@ -103,6 +103,7 @@ struct FigureList {
   std::string_view prefix = {};  // of the names of channels
   std::span<const Figure> figures;
   TableForm form = {};
+  ReadMode mode = ReadMode::Once;
 };
 
 /// Publishes those figures of the list that the text at `path` has now.
