@@ -352,6 +352,7 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
       close(descriptor);
     pause();
   });
+  ASSERT_EQ(setns(own.get(), CLONE_NEWPID), 0);  // for the children of later tests
   recorded.wait();
   const std::string segment = segments().at(0);
   const Descriptor file(open(segment.c_str(), O_RDONLY));
@@ -403,6 +404,7 @@ TEST_F(Recording, AForkedChildThatExecutesRecordsForItself) {
 }
 
 TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
+  const Descriptor own(open("/proc/self/ns/pid", O_RDONLY | O_CLOEXEC));
   if (unshare(CLONE_NEWPID) != 0) GTEST_SKIP() << "may not make a PID namespace";
   const Gate recorded;
   const pid_t child = start([&] {  // process 1 there
