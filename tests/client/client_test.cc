@@ -352,7 +352,6 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
       close(descriptor);
     pause();
   });
-  ASSERT_EQ(setns(own.get(), CLONE_NEWPID), 0);  // for the children of later tests
   recorded.wait();
   const std::string segment = segments().at(0);
   const Descriptor file(open(segment.c_str(), O_RDONLY));
@@ -413,6 +412,7 @@ TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
     recorded.open();
     pause();
   });
+  ASSERT_EQ(setns(own.get(), CLONE_NEWPID), 0);  // for the children of later tests
   recorded.wait();
   const std::string segment = segments().at(0);
   const Descriptor file(open(segment.c_str(), O_RDONLY));
