@@ -16,7 +16,8 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
   if (noting.hasErrors()) context.setExitStatus(kExitFailure);
   // For a driver whose channels cannot be read, the notes have only the library's words.
   if (channels && noting.hasPrinted()) {
-    context.note("these drivers are left out: 'tavrelctl registry show ID' shows what they publish");
+    context.note(
+        "these drivers are left out: 'tavrelctl registry show ID' shows what they publish");
   }
   if (channels && selection.live != selection.recorded) {
     keepOrigin(*channels, selection, context.linuxPlatform().registry().liveServices());
