@@ -99,22 +99,21 @@ def summary(times):
 
 
 def measure(label, command, environment, floor=None, runs=RUNS):
-    """Median CPU milliseconds, their ratio to the floor (a label and a command), peak MiB."""
+    """Median CPU milliseconds of the command and of its floor (a label and a command), peak MiB."""
     commands = [command] if floor is None else [command, floor[1]]
     for each in commands:
         run_once(each, environment)
     times = list(zip(*([run_once(each, environment)[0] for each in commands] for _ in range(runs))))
     memory = peak_mebibytes(command, environment)
     median, text = summary(times[0])
-    ratio = 0.0
+    floor_median = 0.0
     line = f"  {label:<34} {text:<34} {memory:6.1f} MiB"
     if floor is not None:
         floor_median, floor_text = summary(times[1])
-        ratio = median / floor_median
-        line += f"   {ratio:.2f} x the floor"
+        line += f"   {median / floor_median:.2f} x the floor"
         print(f"  {floor[0]:<34} {floor_text}")
     print(line, end="")
-    return median, ratio, memory
+    return median, floor_median, memory
 
 
 def scalar_lines(count):
@@ -151,8 +150,9 @@ def daily_scalars(bin_directory, wanted):
     whitelist = device.path(WHITELIST)
     floor = floor_of(device, "xml", whitelist, "md5", whitelist, "scalars", device.path(STORE),
                      str(DAY))
-    median, _, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
-                           ("Expat, MD5 and SQLite alone", floor), runs=40)
+    median, libraries, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
+                                   ("Expat, MD5 and SQLite alone", floor), runs=40)
+    wanted.calibrate(libraries)
     print(wanted.judge("2,000 scalars, ms", median))
     device.close()
 
@@ -162,9 +162,9 @@ def nothing_to_do(bin_directory, wanted):
     device = Device(bin_directory)
     run_once(device.daemon("-d"), device.environment)
     empty = [os.path.join(device.bin, "tavrel_empty")]
-    _, ratio, _ = measure("tavrel -d", device.daemon("-d"), device.environment,
-                          ("an empty program", empty), runs=200)
-    print(wanted.judge("nothing to do: ratio to an empty program", ratio))
+    median, floor, _ = measure("tavrel -d", device.daemon("-d"), device.environment,
+                               ("an empty program", empty), runs=200)
+    print(wanted.judge("nothing to do: ratio to an empty program", median / floor))
     device.close()
 
 
