@@ -80,8 +80,10 @@ void SqliteBatch::begin() {
 }
 
 void SqliteBatch::takeKeptValues() {
-  const auto values = kept_.read();
-  if (!values) return site_.log.write(LogLevel::Error, values.error().message);
+  const auto read = kept_.read();
+  if (!read) return site_.log.write(LogLevel::Error, read.error().message);
+  if (!*read) return setDamagedValuesAside();
+  const auto& values = *read;
   if (values->empty()) return;
   const auto taken = static_cast<std::uint32_t>(connection_.integer("PRAGMA application_id"));
   const auto last = std::find_if(values->rbegin(), values->rend(),
@@ -93,13 +95,25 @@ void SqliteBatch::takeKeptValues() {
   connection_.execute(("PRAGMA application_id = " + number).c_str());
 }
 
+// Another process may have replaced the file in the meantime.
+void SqliteBatch::setDamagedValuesAside() {
+  try {
+    const StoreFolderLock lock(site_.path, *site_.busy);
+    const std::string line = kept_.setAsideIfDamaged();
+    if (!line.empty()) site_.log.write(LogLevel::Error, line);
+  } catch (const StoreFailure& failure) {
+    site_.tell(failure, "; the values kept beside the store are damaged and stay");
+  }
+}
+
 // Values that others have kept in the meantime stay, and so does the file when it cannot be removed
 // now: the number tells the next batch which values to take in.
 void SqliteBatch::removeTakenValues() {
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
     const auto values = kept_.read();
-    if (values && !values->empty() && values->back().number == takenNumber_) kept_.remove();
+    if (!values || !*values || (*values)->empty()) return;
+    if ((*values)->back().number == takenNumber_) kept_.remove();
   } catch (const StoreFailure&) {
   }
 }

@@ -100,6 +100,7 @@ class SqliteBatch {
 
   void begin();
   void takeKeptValues();
+  void setDamagedValuesAside();
   void removeTakenValues();
   void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
