@@ -12,6 +12,7 @@
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "recording.h"
@@ -434,6 +435,32 @@ TEST_F(FoldTest, AStoreThatTakesNothingLetsSegmentsWait) {
   look();
   EXPECT_EQ(scalar("count"), 1);
   EXPECT_TRUE(segments().empty());
+}
+
+TEST_F(FoldTest, ARowThatTakesNothingRefusesItsValuesAlone) {
+  const auto recordAll = [] {
+    for (const char* key : {"damaged", "whole"})
+      BHClientDistributionRecord(BHClientDistributionForKey(key), 1);
+    add(1);
+  };
+  run(recordAll);
+  EXPECT_EQ(foldNow().refused, 0U);
+  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
+      .execute("UPDATE distributions SET count = 2 WHERE key = CAST('damaged' AS BLOB)");
+  run(recordAll);
+  const FoldReport report = foldNow();
+  EXPECT_FALSE(report.failure) << *report.failure;
+  EXPECT_EQ(report.refused, 1U);
+  ASSERT_EQ(log.lines.size(), 1U);
+  EXPECT_NE(log.lines[0].find("; what was recorded for \"damaged\" on day "), std::string::npos)
+      << log.lines[0];
+  EXPECT_TRUE(segments().empty());
+  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
+      .execute("DELETE FROM distributions WHERE key = CAST('damaged' AS BLOB)");
+  look();
+  EXPECT_EQ(scalar("count"), 2);
+  EXPECT_EQ(figure("refused"), 1);
+  EXPECT_EQ(records["whole"].size(), 2U);
 }
 
 TEST_F(FoldTest, PositionsGoWithTheirSegments) {

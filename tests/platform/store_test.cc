@@ -6,6 +6,7 @@
 #include <sys/resource.h>
 
 #include "device_services.h"
+#include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/store_path.h"
@@ -532,10 +533,17 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
     damaged[i] = static_cast<char>(damaged[i] ^ 1);
     write(std::string(kStorePath) + "-kept", i == 0 ? "cut" : damaged);
     store_->BHClientCheckpoint();
-    EXPECT_EQ(log.lines.back(),
-              "values kept in " + kept + " are lost: the file is damaged; remove it");
+    EXPECT_EQ(log.lines.back(), "values kept in " + kept +
+                                    " are lost: the file is damaged; it is now " + kept +
+                                    "-damaged");
+    EXPECT_FALSE(std::filesystem::exists(kept));
     EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 5}, {"k", kToday, 4}}));
   }
+  // What cannot be read is not replaced.
+  std::filesystem::create_directory(kept);
+  EXPECT_FALSE(KeptValues(store_->path()).add({{0, kToday, 1, "d"}}));
+  EXPECT_TRUE(std::filesystem::is_directory(kept));
+  std::filesystem::remove(kept);
   for (const char value : {'a', 'b', 'c'})
     keep(std::string(400'000, value).c_str(), 1);
   EXPECT_TRUE(log.says(kept + " is full: the 1 earliest values are dropped"));

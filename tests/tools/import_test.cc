@@ -328,7 +328,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
   }
   EXPECT_EQ(out.str(), "kept 2 samples of this machine, taken over 1 second\n");
   EXPECT_EQ(error.str(),
-            "tavrelctl: not recorded, as the machine did not tell in this time: "
+            "tavrelctl: not recorded, no reading available: "
             "com.norvane.usage.processes\n");
 
   std::string all = exported(device);

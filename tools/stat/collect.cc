@@ -183,7 +183,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
   if (endsEarly) context.note(format("ended by a signal before %u seconds were over", seconds));
   // One reading alone gives no rates, which needs no message.
   if (const std::string keys = collector.missing(); collector.count() > 1 && !keys.empty()) {
-    context.note("not recorded, as the machine did not tell in this time:" + keys);
+    context.note("not recorded, no reading available:" + keys);
   }
 }
 

@@ -81,7 +81,7 @@ void addStatCommands(Command app, ToolContext& context) {
       arguments, context,
       [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
   import.addOption("FILE", arguments->file,
-                   "Kept as a whole or not at all; - is standard input (default)");
+                   "All of it is kept, or nothing; - is standard input (default)");
   import.setFooter(
       "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar replaces\n"
       "that of its day. Values are added to those of their day: importing a file twice doubles\n"
@@ -115,7 +115,7 @@ void addStatCommands(Command app, ToolContext& context) {
   context.addJsonOption(folded);
 
   const Command shown =
-      addCommand(group, "show", "Show one statistic: its values by day, and what they come to",
+      addCommand(group, "show", "Show one statistic: its values by day, and a summary of them",
                  arguments, context, [](ToolContext& tool, const Arguments& given) {
                    showStatistic(tool, given.key, given.days);
                  });

@@ -92,6 +92,8 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   do {
     const auto batch = store_.beginBatch();
     if (!batch) return batch.error();
+    // One damaged row must not keep all that programs recorded from the store.
+    (*batch)->refuseUnwritableSeries();
     Status done = fillBatch(**batch, listing.segments);
     if (done) done = (*batch)->commit();
     if (!done) return done;
@@ -120,7 +122,9 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& s
     if (Status done = dropPositions(batch); !done) return done;
   }
   if (Status done = changes_.giveTo(batch); !done) return done;
-  counts_.refused += changes_.overflows();
+  const auto refused = batch.refusedValues();
+  if (!refused) return refused.error();
+  counts_.refused += changes_.overflows() + *refused;
   const std::pair<const char*, std::uint64_t> figures[] = {
       {"com.norvane.brimhold.dropped", counts_.dropped},
       {"com.norvane.brimhold.refused", counts_.refused},

@@ -41,25 +41,16 @@ std::uint32_t newNumber() {
   return *loadLittle32(bytes, 0) | 1U;  // never 0, the id of a new store
 }
 
-}  // namespace
-
-Expected<std::vector<KeptValue>> KeptValues::read() {
-  const auto content = files_.readIfPresent(path_, limits::kKeptValueBytes + kDigestBytes);
-  if (!content) return content.error();
+KeptContent decode(std::string_view text) {
   std::vector<KeptValue> values;
-  if (!*content) return values;
-  const auto damaged = [this] {
-    return Error{"values kept in " + path_ + " are lost: the file is damaged; remove it"};
-  };
-  const std::string_view text = **content;
-  if (text.size() < kDigestBytes) return damaged();
+  if (text.size() < kDigestBytes) return std::nullopt;
   const ByteSpan entries = asBytes(text.substr(0, text.size() - kDigestBytes));
   const auto digest = sha256(entries);
-  if (text.substr(entries.size()) != asText(digest)) return damaged();
+  if (text.substr(entries.size()) != asText(digest)) return std::nullopt;
   for (std::size_t at = 0; at < entries.size();) {
     const auto keySize = loadLittle32(entries, at + kKeySizeAt);
     const auto key = keySize ? slice(entries, at + kHeadBytes, *keySize) : std::nullopt;
-    if (!key) return damaged();
+    if (!key) return std::nullopt;
     values.push_back({*loadLittle32(entries, at + kNumberAt),
                       static_cast<std::int32_t>(*loadLittle32(entries, at + kDayAt)),
                       static_cast<std::int64_t>(*loadLittle64(entries, at + kValueAt)),
@@ -69,14 +60,36 @@ Expected<std::vector<KeptValue>> KeptValues::read() {
   return values;
 }
 
+}  // namespace
+
+Expected<KeptContent> KeptValues::read() {
+  constexpr std::size_t kLargest = limits::kKeptValueBytes + kDigestBytes;
+  const auto file = FileSystem::status(path_);
+  if (file && S_ISREG(file->st_mode) && file->st_size > static_cast<off_t>(kLargest))
+    return KeptContent();
+  const auto content = files_.readIfPresent(path_, kLargest);
+  if (!content) return content.error();
+  if (!*content) return KeptContent(std::in_place);
+  return decode(**content);
+}
+
+std::string KeptValues::setAsideIfDamaged() {
+  if (const auto values = read(); !values || *values) return {};
+  const std::string aside = path_ + "-damaged";
+  const Status moved = files_.rename(path_, aside);
+  return "values kept in " + path_ + " are lost: the file is damaged; " +
+         (moved ? "it is now " + aside : moved.error().message);
+}
+
 Expected<std::size_t> KeptValues::add(std::vector<KeptValue> values) {
   const std::uint32_t number = newNumber();
   for (KeptValue& value : values)
     value.number = number;
-  if (auto earlier = read()) {
-    values.insert(values.begin(), std::move_iterator(earlier->begin()),
-                  std::move_iterator(earlier->end()));
-  }
+  auto earlier = read();
+  if (!earlier) return earlier.error();
+  if (!*earlier) return Error{path_ + " is damaged: move it away"};
+  values.insert(values.begin(), std::move_iterator((*earlier)->begin()),
+                std::move_iterator((*earlier)->end()));
   std::size_t bytes = 0;
   std::size_t first = values.size();
   while (first > 0 && bytes + bytesOf(values[first - 1]) <= limits::kKeptValueBytes)

@@ -24,6 +24,9 @@ struct KeptValue {
   std::string key;
 };
 
+/// Nullopt when the file is damaged.
+using KeptContent = std::optional<std::vector<KeptValue>>;
+
 /// Processes that change the file take turns through the lock on the store's folder.
 class KeptValues {
  public:
@@ -31,11 +34,15 @@ class KeptValues {
 
   bool exist() const { return FileSystem::status(path_).has_value(); }
   /// In the order in which they were kept; none when there is no file.
-  Expected<std::vector<KeptValue>> read();
+  Expected<KeptContent> read();
   /// Adds values durably to those of the file, and gives them their numbers. Drops the earliest
-  /// beyond `limits::kKeptValueBytes` and yields how many. Replaces a damaged file.
+  /// beyond `limits::kKeptValueBytes` and yields how many. Fails when the file
+  /// is damaged or cannot be read.
   Expected<std::size_t> add(std::vector<KeptValue> values);
   void remove() { files_.discard(path_); }
+  /// Moves a damaged file to `PATH-damaged`, in place of the one that was moved before. Yields a
+  /// line about it, or nothing when the file is not damaged.
+  std::string setAsideIfDamaged();
 
  private:
   std::string path_;

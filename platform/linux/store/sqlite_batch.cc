@@ -6,6 +6,7 @@
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
+#include "base/text.h"
 #include "platform/linux/store/chunk_reader.h"
 #include "platform/linux/store/sqlite_schema.h"
 
@@ -29,10 +30,15 @@ void checkKey(std::string_view key) {
                                             std::to_string(limits::kStoreKeyBytes)};
 }
 
+// Of one row, before anything of it has been changed.
+struct RowFailure : StoreFailure {
+  using StoreFailure::StoreFailure;
+};
+
 [[noreturn]] void throwInconsistent() {
-  throw StoreFailure{StoreFault::Other,
-                     "the values of a distribution do not match their count: restore the file from "
-                     "a copy or move it away"};
+  throw RowFailure{StoreFault::Other,
+                   "the values of a distribution do not match their count: restore the file from "
+                   "a copy or move it away"};
 }
 
 }  // namespace
@@ -80,8 +86,10 @@ void SqliteBatch::begin() {
 }
 
 void SqliteBatch::takeKeptValues() {
-  const auto values = kept_.read();
-  if (!values) return site_.log.write(LogLevel::Error, values.error().message);
+  const auto read = kept_.read();
+  if (!read) return site_.log.write(LogLevel::Error, read.error().message);
+  if (!*read) return setDamagedValuesAside();
+  const auto& values = *read;
   if (values->empty()) return;
   const auto taken = static_cast<std::uint32_t>(connection_.integer("PRAGMA application_id"));
   const auto last = std::find_if(values->rbegin(), values->rend(),
@@ -93,13 +101,25 @@ void SqliteBatch::takeKeptValues() {
   connection_.execute(("PRAGMA application_id = " + number).c_str());
 }
 
+// Another process may have replaced the file in the meantime.
+void SqliteBatch::setDamagedValuesAside() {
+  try {
+    const StoreFolderLock lock(site_.path, *site_.busy);
+    const std::string line = kept_.setAsideIfDamaged();
+    if (!line.empty()) site_.log.write(LogLevel::Error, line);
+  } catch (const StoreFailure& failure) {
+    site_.tell(failure, "; the values kept beside the store are damaged and stay");
+  }
+}
+
 // Values that others have kept in the meantime stay, and so does the file when it cannot be removed
 // now: the number tells the next batch which values to take in.
 void SqliteBatch::removeTakenValues() {
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
     const auto values = kept_.read();
-    if (values && !values->empty() && values->back().number == takenNumber_) kept_.remove();
+    if (!values || !*values || (*values)->empty()) return;
+    if ((*values)->back().number == takenNumber_) kept_.remove();
   } catch (const StoreFailure&) {
   }
 }
@@ -280,11 +300,33 @@ void SqliteBatch::writeDistributions() {
   std::sort(series.begin(), series.end(), [](const auto* a, const auto* b) {
     return a->first.day != b->first.day ? a->first.day < b->first.day : a->first.key < b->first.key;
   });
-  for (const auto* entry : series)
-    writeSeries(entry->first, {entry->second->values, entry->second->offsets});
+  for (const auto* entry : series) {
+    const DistributionBlock added{entry->second->values, entry->second->offsets};
+    try {
+      writeSeries(entry->first, added);
+    } catch (const RowFailure& failure) {
+      if (!refuses_) throw;
+      if (refused_ == 0) {
+        std::string key;
+        appendQuoted(key, entry->first.key.substr(0, 80));
+        site_.tell(failure, "; what was recorded for " + key + " on day " +
+                                std::to_string(entry->first.day) + " is refused");
+      }
+      refused_ += added.values.size() / kPackedValueBytes;
+    }
+  }
   last_ = nullptr;
   pending_.clear();
   pendingBytes_ = 0;
+}
+
+Expected<std::uint64_t> SqliteBatch::refusedValues() {
+  try {
+    writeDistributions();
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return refused_;
 }
 
 void SqliteBatch::writeSeries(const SeriesName& name, const DistributionBlock& added) {
@@ -296,6 +338,7 @@ void SqliteBatch::writeSeries(const SeriesName& name, const DistributionBlock& a
   if (sql.getRuns.step()) {
     count = sql.getRuns.integer(0);
     auto unpacked = unpackRuns(sql.getRuns.bytes(1));
+    sql.getRuns.reset();
     if (!unpacked || count <= 0 || valuesIn(*unpacked) != count) throwInconsistent();
     runs = std::move(*unpacked);
   }
@@ -303,9 +346,9 @@ void SqliteBatch::writeSeries(const SeriesName& name, const DistributionBlock& a
 
   const auto addedCount = static_cast<std::int64_t>(added.values.size() / kPackedValueBytes);
   if (addedCount > kValuesPerDistribution - count) {
-    throw StoreFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
-                                              " values of one day and takes no more: use another "
-                                              "key"};
+    throw RowFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
+                                            " values of one day and takes no more: use another "
+                                            "key"};
   }
   runs.push_back({0, 0, addedCount});
   const std::size_t first = std::min(firstToJoin(runs), runs.size() - 1);

@@ -62,6 +62,12 @@ class SqliteBatch {
                             std::string_view position);
   Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);
 
+  /// From now on, values for a distribution that takes none, as its row is damaged or full, are
+  /// dropped in place of failing the batch. The first such row is a line in the log.
+  void refuseUnwritableSeries() { refuses_ = true; }
+  /// Writes the distributions that wait, and yields how many values were dropped so far.
+  Expected<std::uint64_t> refusedValues();
+
   /// Keeps the changes and ends the batch.
   Status commit();
 
@@ -100,6 +106,7 @@ class SqliteBatch {
 
   void begin();
   void takeKeptValues();
+  void setDamagedValuesAside();
   void removeTakenValues();
   void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
@@ -125,6 +132,8 @@ class SqliteBatch {
   std::size_t pendingBytes_ = 0;  // of `pending_`
   // Values of one distribution often follow each other.
   const PendingMap::value_type* last_ = nullptr;
+  bool refuses_ = false;
+  std::uint64_t refused_ = 0;
   std::int64_t nextChunk_ = -1;  // not looked up yet when negative
 };
 

@@ -39,7 +39,7 @@ CREATE TABLE chunks (
   data BLOB NOT NULL
 ) STRICT)";
 constexpr const char* kSegmentsTable = R"(
-CREATE TABLE IF NOT EXISTS segments (
+CREATE TABLE segments (
   owner INTEGER NOT NULL,
   identity BLOB NOT NULL,
   position BLOB NOT NULL,

@@ -110,7 +110,10 @@ bool SqliteStore::keep(const StoreFailure& failure) {
   const std::string count = "; " + std::to_string(values.size()) + (isOne ? " value " : " values ");
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
-    const auto dropped = KeptValues(site_.path).add(std::move(values));
+    KeptValues kept(site_.path);
+    const std::string damage = kept.setAsideIfDamaged();
+    if (!damage.empty()) site_.log.write(LogLevel::Error, damage);
+    const auto dropped = kept.add(std::move(values));
     if (!dropped) throw StoreFailure{StoreFault::Device, dropped.error().message};
     site_.tell(failure, count + (isOne ? "waits" : "wait") + " for the next commit");
     if (*dropped > 0) {
