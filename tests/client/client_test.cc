@@ -177,6 +177,9 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
                               {{"count", kToday}, 1000 + 100 + 101},
                               {{"gauge", kToday - 1}, 99},
                               {{"gauge", kToday}, 101}}));
+  constexpr std::int64_t kSecond = 1'000'000'000;
+  EXPECT_EQ(setTimes, (std::vector<std::int64_t>{(*boot + 99) * kSecond, (*boot + 100) * kSecond,
+                                                 (*boot + 101) * kSecond}));
   EXPECT_EQ(seconds,
             (std::vector<std::int64_t>{*boot + 99, *boot + 100, *boot + 101, kToday * 86'400 + 2}));
   EXPECT_TRUE(segments().empty());

@@ -4,6 +4,7 @@
 #include <cstdlib>
 #include <fstream>
 #include <random>
+#include <set>
 #include <sys/mount.h>
 #include <sys/stat.h>
 #include <sys/vfs.h>
@@ -11,6 +12,7 @@
 
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -53,6 +55,7 @@ class FoldTest : public Recording {
   void look(bool alsoWaiting = false) {
     scalars.clear();
     records.clear();
+    std::set<std::int32_t> days;
     KeptLog own;
     LinuxPlatform device(DeviceRoot(root), {.log = &own});
     const DeviceRoot place(alsoWaiting ? root.string() : "/nowhere");
@@ -61,16 +64,23 @@ class FoldTest : public Recording {
     ASSERT_TRUE(history) << history.error().message;
     ASSERT_TRUE(history->walkScalars([&](auto key, auto day, auto value, bool&) {
       EXPECT_TRUE(scalars.emplace(std::pair(key, day), value).second) << key;
+      days.insert(day);
     }));
-    ASSERT_TRUE(history->walkDistributions([&](auto key, auto, auto count, auto& values, bool&) {
-      double value = 0;
-      std::uint32_t second = 0;
-      auto& row = records[std::string(key)];
-      const std::size_t before = row.size();
-      while (values.getNextValue(value, second))
-        row.push_back(value);
-      EXPECT_EQ(row.size() - before, static_cast<std::size_t>(count)) << key;
-    }));
+    ASSERT_TRUE(
+        history->walkDistributions([&](auto key, auto day, auto count, auto& values, bool&) {
+          days.insert(day);
+          double value = 0;
+          std::uint32_t second = 0;
+          auto& row = records[std::string(key)];
+          const std::size_t before = row.size();
+          while (values.getNextValue(value, second))
+            row.push_back(value);
+          EXPECT_EQ(row.size() - before, static_cast<std::size_t>(count)) << key;
+        }));
+    const auto held = history->daysHeld();
+    ASSERT_TRUE(held && held->has_value() == !days.empty());
+    if (!*held) return;
+    EXPECT_EQ(std::pair((*held)->first, (*held)->last), std::pair(*days.begin(), *days.rbegin()));
   }
   std::int64_t figure(const char* name) {
     const std::string key = std::string("com.norvane.brimhold.") + name;
@@ -169,7 +179,7 @@ TEST_F(FoldTest, AKilledProgramLosesAndRepeatsNothing) {
 
 TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
   const std::int64_t midnight = (kToday + 1) * 86'400;
-  const std::int64_t days[] = {kToday, kToday + 1, kToday - 400, kToday + 30'000, kToday};
+  const std::int64_t days[] = {kToday, kToday + 1, kToday - 400, 2'932'896, kToday};
   const pid_t child = start([&] {
     for (const std::int64_t day : days) {
       for (const std::int64_t second : {0, 86'399}) {
@@ -182,7 +192,8 @@ TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
   });
   for (std::size_t i = 0; i < std::size(days); ++i) {
     waitpid(child, nullptr, WUNTRACED);
-    foldNow();
+    look(true);
+    if (i > 0) foldNow();  // two days wait at once
     kill(child, SIGCONT);
   }
   EXPECT_EQ(waitFor(child), 0);
@@ -191,7 +202,7 @@ TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
   EXPECT_EQ(scalars, (Scalars{{{"count", kToday - 400}, 2},
                               {{"count", kToday}, 4},
                               {{"count", kToday + 1}, 2},
-                              {{"count", kToday + 30'000}, 2}}));
+                              {{"count", 2'932'896}, 2}}));
   EXPECT_EQ(records["series"].size(), 10U);
 }
 
@@ -237,8 +248,8 @@ TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {
 TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
   const pid_t child = start([] {
     for (int round = 0; round < 3; ++round) {
-      for (int i = 0; i < 400; ++i)
-        record(round * 1000 + i);
+      for (int i = 0; i < 2500; ++i)  // more than are read at once
+        record(round * 10'000 + i);
       add(10);
       set(round);
       BHClientDistributionRecord(BHClientDistributionForKey("a"), round);
@@ -251,7 +262,7 @@ TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
     look(true);
     const auto seen = std::pair(scalars, records);
     EXPECT_EQ(scalar("count"), 10 * (round + 1));
-    EXPECT_EQ(foldNow().values, 401U);
+    EXPECT_EQ(foldNow().values, 2501U);
     for (const bool alsoWaiting : {false, true}) {
       look(alsoWaiting);
       EXPECT_EQ(std::pair(scalars, records), seen);
@@ -284,6 +295,10 @@ TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
   EXPECT_EQ(foldNow().refused, 1U);
   look();
   EXPECT_EQ(scalar("count"), 3);  // the largest amount did not fit behind the first
+  run([] { add(INT64_MAX); });
+  EXPECT_EQ(foldNow().refused, 1U);
+  look();
+  EXPECT_EQ(scalar("count"), 3);  // nor what the store held
 }
 
 TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
@@ -369,6 +384,12 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   EXPECT_EQ(log.lines, Lines());
   look();
   EXPECT_EQ(figure("segments_refused"), 7);
+
+  for (int i = 0; i < 200; ++i)
+    put(std::to_string(i).c_str(), 0);
+  EXPECT_EQ(foldNow().segmentsRefused, 200U);
+  EXPECT_EQ(log.lines.size(), 100U - 7 + 1);  // with those of the fold before
+  EXPECT_EQ(log.lines.back(), "107 more refusals of this fold are not told");
 }
 
 TEST_F(FoldTest, RandomBytesDoNoHarm) {
@@ -481,6 +502,49 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   EXPECT_EQ(held(), 1U);
   kill(child, SIGKILL);
   waitFor(child);
+
+  // A segment that cannot be opened now keeps its position.
+  const std::string segment = segments().at(0);
+  signal(SIGIO, SIG_IGN);
+  {
+    const Descriptor leased(open(segment.c_str(), O_RDWR | O_CLOEXEC));
+    ASSERT_EQ(fcntl(leased.get(), F_SETLEASE, F_WRLCK), 0);
+    EXPECT_EQ(foldNow().segmentsRefused, 1U);
+    EXPECT_EQ(held(), 1U);
+    const std::uint64_t most = UINT64_MAX;
+    EXPECT_EQ(pwrite(leased.get(), &most, sizeof most, kBHHeaderDropped), 8);
+  }
+  EXPECT_EQ(foldNow().removed, 1U);
+  look();
+  EXPECT_EQ(scalar("count"), 3);
+  EXPECT_EQ(figure("dropped"), 1'000'000'000);
+}
+
+TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
+  testClock().realtime = 1000;
+  testClock().boot = 100;
+  run([] {
+    add(1);
+    record(0);
+  });
+  EXPECT_EQ(foldNow().removed, 0U);
+  testClock().realtime = kToday * 86'400;
+  EXPECT_EQ(foldNow().removed, 1U);
+  look();
+  EXPECT_EQ(scalar("count", kToday), 1);
+  expectEachOnce(1);
+}
+
+TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
+  run([] { add(1); });
+  const auto opened = SegmentFolder::open(DeviceRoot(root));
+  const auto segment = (*opened)->openSegment((*opened)->list().segments.at(0));
+  EXPECT_TRUE((*opened)->openToAcknowledge(**segment));
+  const std::string path = segments().at(0);
+  std::filesystem::copy_file(path, root / "copy");
+  std::filesystem::rename(root / "copy", path);
+  EXPECT_FALSE((*opened)->openToAcknowledge(**segment));
+  EXPECT_FALSE((*opened)->remove(**segment));
 }
 
 }  // namespace

@@ -95,6 +95,7 @@ class Recording : public testing::Test, public SegmentSink {
   void takeScalar(const SegmentScalar& scalar) override {
     auto& sum = scalars[{std::string(scalar.key), scalar.day}];
     sum = scalar.isSet ? scalar.value : sum + scalar.value;
+    if (scalar.isSet) setTimes.push_back(scalar.setTime);
   }
   void takeRecord(const SegmentRecord& record) override {
     records[std::string(record.key)].push_back(record.value);
@@ -123,6 +124,7 @@ class Recording : public testing::Test, public SegmentSink {
   Scalars scalars;
   std::map<std::string, std::vector<double>> records;
   std::vector<std::int64_t> seconds;
+  std::vector<std::int64_t> setTimes;  // nanoseconds
   std::uint64_t dropped = 0;
   std::map<std::string, std::string> positions;
 };

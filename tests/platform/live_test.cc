@@ -83,6 +83,16 @@ TEST(LiveMachineTest, FilesStayOpen) {
   EXPECT_EQ(channels.update(), "boot.seconds=1 ");
 }
 
+TEST(LiveMachineTest, AProcessorThatComesLaterHasNoPlace) {
+  DeviceServices device;
+  device.write("/proc/softirqs", " CPU0\n HI: 1\n NET: 2\n");
+  LiveMachine live(device.root, device.log);
+  Subscribed channels(live);
+  EXPECT_EQ(channels.update(), "softirq.HI=1 softirq.NET=2 ");
+  device.write("/proc/softirqs", " CPU0 CPU1\n HI: 3 7\n NET: 4 8\n");
+  EXPECT_EQ(channels.update(), "softirq.HI=3 softirq.NET=4 ");
+}
+
 TEST(LiveMachineTest, ManyInterfacesHideNothing) {
   DeviceServices device;
   std::string table = "one\ntwo\n";

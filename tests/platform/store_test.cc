@@ -218,6 +218,18 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
         }
       });
   EXPECT_EQ(keys, (Lines{"d.one", "d.two"}));
+
+  // More than waits in memory.
+  auto batch = store_->beginBatch();
+  const std::vector<Sample> many(700'000, Sample{1, 2});
+  ASSERT_TRUE((*batch)->appendValues(kToday, "many", many));
+  ASSERT_TRUE((*batch)->commit());
+  std::size_t found = 0;
+  EXPECT_TRUE((*store_->openHistory())
+                  ->walkDistribution(
+                      "many", kToday, kToday,
+                      [&](auto, auto, auto, auto& values, auto&) { found = take(values).size(); }));
+  EXPECT_EQ(found, many.size());
 }
 
 /// A store as version 1 of the schema left it: day 20784 with two distributions and two scalars.
@@ -236,6 +248,10 @@ INSERT INTO distributions VALUES (20784, CAST('long' AS BLOB), 0, 1026),
 INSERT INTO chunks VALUES
   (0, CAST(replace(hex(zeroblob(1024)), '00', 'ABCDEFGHabcd') AS BLOB)),
   (1, CAST('IJKLMNOPefghIJKLMNOPefgh' AS BLOB)), (1048576, CAST('QRSTUVWXijkl' AS BLOB));
+-- The last series that could exist, and whole chunks.
+INSERT INTO distributions VALUES (20784, CAST('far' AS BLOB), 4398046511103, 1024);
+INSERT INTO chunks VALUES
+  (4398046511103 << 20, CAST(replace(hex(zeroblob(1024)), '00', 'ABCDEFGHabcd') AS BLOB));
 )";
 
 TEST_F(StoreTest, ReadsAndConvertsVersion1) {
@@ -273,11 +289,19 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
     const Status done = (*batch)->commit();
     return done ? std::string("done") : done.error().message;
   };
-  const Lines before = {
-      "a=5",     "b=-6",          "long 1026", "ABCDEFGHabcd 1024", "IJKLMNOPefgh 2",
-      "short 1", "QRSTUVWXijkl 1"};
+  const Lines before = {"a=5",
+                        "b=-6",
+                        "far 1024",
+                        "ABCDEFGHabcd 1024",
+                        "long 1026",
+                        "ABCDEFGHabcd 1024",
+                        "IJKLMNOPefgh 2",
+                        "short 1",
+                        "QRSTUVWXijkl 1"};
   const Lines after = {"a=5",
                        "b=7",
+                       "far 1024",
+                       "ABCDEFGHabcd 1024",
                        "long 1026",
                        "ABCDEFGHabcd 1024",
                        "IJKLMNOPefgh 2",
@@ -387,7 +411,11 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
       {"UPDATE distributions SET count = -1" + ofBad,
        "it does not hold the -1 values that it counts", false},
       {"UPDATE distributions SET runs = x'000180'" + ofBad, "it refers to values that cannot exist",
-       false}};
+       false},
+      {"UPDATE distributions SET runs = x'FEFFFFFFFFFFFFFF7F0201'" + ofBad,
+       "it refers to values that cannot exist", false},
+      {"UPDATE chunks SET data = zeroblob(8 * 1025) WHERE chunk = 0",
+       "its values are not in the form that this program writes", true}};
   for (const auto& [change, reason, takesMore] : cases) {
     SCOPED_TRACE(change);
     settle();
@@ -420,6 +448,17 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
     EXPECT_EQ(static_cast<bool>((*batch)->commit()), takesMore);
     batch->reset();
   }
+  settle();
+  write(kStorePath, whole);
+  sql("UPDATE distributions SET count = 2, runs = x'000202'" + ofBad);
+  EXPECT_EQ((*store_->openHistory())
+                ->walkDistribution("bad\n", kFirstDay, kLastDay,
+                                   [&](auto, auto, auto, auto& values, auto&) { take(values); })
+                .error()
+                .message,
+            where() +
+                "distribution \"bad\\n\" of day 20784: it does not hold the 2 values that it "
+                "counts: restore the file from a copy or move it away");
   sql("DELETE FROM chunks");
   EXPECT_TRUE((*store_->openHistory())
                   ->walkDistributions("", kFirstDay, kLastDay,
@@ -506,11 +545,12 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
   const std::string kept = store_->path() + "-kept";
   set({{"k", kToday, 1}});
   const auto impatient = open(1);
-  const auto keep = [&](const char* key, std::int64_t value) {
+  const auto keep = [&](const char* key, std::int64_t value, bool commits = false) {
     auto writer = store_->beginBatch();
     EXPECT_TRUE((*writer)->addScalar(kToday, "lock", 1));
     impatient->BHClientSetValueForScalarKey(key, value);
     EXPECT_TRUE(impatient->BHClientCheckpoint());
+    EXPECT_TRUE(!commits || (*writer)->commit());
   };
   keep("k", 2);
   keep("j", 3);
@@ -549,6 +589,13 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
   EXPECT_TRUE(log.says(kept + " is full: the 1 earliest values are dropped"));
   store_->BHClientCheckpoint();
   EXPECT_EQ(scalarsOfToday().size(), 4U);
+
+  // What is kept between taking values in and their commit is not lost with them.
+  keep("j", 6);
+  keep("j", 7, true);
+  EXPECT_TRUE(std::filesystem::exists(kept));
+  store_->BHClientCheckpoint();
+  EXPECT_EQ(scalarsOfToday().at(2).value, 7);
 }
 
 TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {

@@ -67,6 +67,7 @@ TEST(StatsdLine, IsParsedWithinItsBounds) {
       {"a:1e999|c", "malformed"},
       {"a:+-1|g", "malformed"},
       {"a:1:2|g", "malformed"},
+      {"a:+1:2|g", "malformed"},
       {"a:1x|c", "malformed"},
       {"a: 1|c", "malformed"},
       {"a:1:|c", "a counter 1"},

@@ -5,6 +5,7 @@
 #include "device.h"
 #include "tools/shared/tool_context.h"
 #include "tools/stat/collect.h"
+#include "tools/stat/collect_state.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/import_number.h"
 #include "tools/stat/value_summary.h"
@@ -294,6 +295,18 @@ struct SlowPace final : CollectPace {
   std::function<void()> change;
   Ticks time;
 };
+
+TEST(CollectState, IsOfThisStartAndNoOlderThanADay) {
+  using namespace std::chrono_literals;
+  const TemporaryDevice device;
+  const std::string path = device.path("/state");
+  ASSERT_TRUE(writeCollectState(path, "boot", {.at = 5ns, .machine = {}, .remainders = {}}));
+  const std::tuple<const char*, std::chrono::nanoseconds, bool> cases[] = {
+      {"boot", 5ns, true},        {"boot", 24h + 5ns, true}, {"boot", 4ns, false},
+      {"boot", 24h + 6ns, false}, {"other", 5ns, false},     {"", 5ns, false}};
+  for (const auto& [boot, now, isUsable] : cases)
+    EXPECT_EQ(readCollectState(path, boot, now)->has_value(), isUsable) << boot << now.count();
+}
 
 TEST(StatCommands, CollectsWhatTheMachineTells) {
   const TemporaryDevice device;
