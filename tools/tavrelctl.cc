@@ -10,6 +10,7 @@
 #include "tools/device/send_commands.h"
 #include "tools/device/status_command.h"
 #include "tools/device/tasking_commands.h"
+#include "tools/disks/disks_command.h"
 #include "tools/log/log_commands.h"
 #include "tools/log/nandlog_commands.h"
 #include "tools/nand/nand_commands.h"
@@ -68,6 +69,7 @@ void run(const std::vector<std::string>& arguments, ToolContext& context) {
   addStatCommands(top, context);
   addSendCommands(top, context);
   addTaskingCommands(top, context);
+  addDisksCommand(top, context);
   addNandCommands(top, context);
   addNandlogCommands(top, context);
   addRecordsCommands(top, context);
