@@ -4,12 +4,14 @@
 // inside. Offsets are 64-bit, so that no sum of 32-bit fields can wrap before it is checked.
 #pragma once
 
+#include <bit>
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
 #include <optional>
 #include <span>
 #include <string_view>
+#include <type_traits>
 
 namespace tavrel {
 
@@ -27,6 +29,12 @@ namespace bytes_detail {
 
 template <class Word>
 constexpr Word assembleLittle(const std::byte* at) {
+  // Compilers do not make one load of the loop.
+  if (!std::is_constant_evaluated() && std::endian::native == std::endian::little) {
+    Word whole;
+    std::memcpy(&whole, at, sizeof whole);
+    return whole;
+  }
   std::uint64_t word = 0;
   for (std::size_t i = 0; i < sizeof(Word); ++i) {
     word |= std::to_integer<std::uint64_t>(at[i]) << (8 * i);
@@ -44,6 +52,10 @@ constexpr std::optional<Word> loadLittle(ByteSpan bytes, std::uint64_t offset) {
 template <class Word>
 constexpr bool storeLittle(MutableByteSpan bytes, std::uint64_t offset, Word word) {
   if (!slice(bytes, offset, sizeof(Word))) return false;
+  if (!std::is_constant_evaluated() && std::endian::native == std::endian::little) {
+    std::memcpy(&bytes[static_cast<std::size_t>(offset)], &word, sizeof word);
+    return true;
+  }
   for (std::size_t i = 0; i < sizeof(Word); ++i) {
     bytes[static_cast<std::size_t>(offset) + i] =
         static_cast<std::byte>(static_cast<std::uint64_t>(word) >> (8 * i));

@@ -71,6 +71,44 @@ inline constexpr int kFileLockMilliseconds = 10'000;
 /// takes.
 inline constexpr std::size_t kStoreKeyBytes = 1U << 20;
 
+/// Files in the folder of segments that a fold looks at. Each costs a system call.
+inline constexpr std::size_t kSegmentFolderEntries = 1'000'000;
+
+/// Segments that a fold reads, of one user and in all. Each live process has one. The others wait
+/// for the next fold.
+inline constexpr std::size_t kSegmentsPerUser = 2'048;
+inline constexpr std::size_t kSegments = 16'384;
+
+/// Measurements that a fold takes from one user and in all; the segments that are left then wait
+/// for the next fold. Segments of 200,000 each that programs fill in an hour stay below.
+inline constexpr std::uint64_t kFoldValuesPerUser = 16'000'000;
+inline constexpr std::uint64_t kFoldValues = 64'000'000;
+
+/// Rows of the store, one per key and day, that a fold changes for one user and in all. Nothing
+/// else keeps a program that makes up keys from filling the store. Values beyond are refused.
+inline constexpr std::size_t kFoldRowsPerUser = 65'536;
+inline constexpr std::size_t kFoldRows = 262'144;
+
+/// Bytes of the keys of the scalars in one transaction of a fold, segments in it, each an open
+/// file, and their measurements: bounds of memory, and of the time for which other writers wait.
+inline constexpr std::size_t kFoldKeyBytes = 4U << 20;
+inline constexpr std::size_t kFoldSegmentsAtOnce = 256;
+inline constexpr std::uint64_t kFoldValuesAtOnce = 4'000'000;
+
+/// Values that one segment can claim to have dropped since the last fold.
+inline constexpr std::uint64_t kLargestDrop = 1'000'000'000;
+
+/// Pieces of distributions that wait to be folded and are remembered for who looks at them: one per
+/// segment, key and day, of 16 bytes.
+inline constexpr std::size_t kWaitingBlocks = 262'144;
+
+/// Files in that folder that one fold refuses by their looks, each with a text in memory.
+inline constexpr std::size_t kListedRefusals = 4'096;
+
+/// Lines about refused files, keys and users that are told until the device restarts: files that
+/// stay are refused by every fold. Further ones are only counted.
+inline constexpr std::size_t kFoldRefusalLines = 100;
+
 /// Age after which a temporary file that a killed process left behind is removed, in seconds.
 inline constexpr std::int64_t kTemporaryFileSeconds = 86'400;
 
@@ -126,5 +164,28 @@ inline constexpr std::size_t kHealthMemoryBytes = 4U << 20;
 /// Seconds after which a drive that was not seen is forgotten: more than a year, so that a drive
 /// that is plugged in once a year goes on counting.
 inline constexpr std::int64_t kDriveMemorySeconds = 400LL * 86'400;
+
+/// Bytes of a text of the kernel. The longest, /proc/interrupts of a machine with many processors,
+/// stays below.
+inline constexpr std::size_t kLiveFileBytes = 4U << 20;
+
+/// Elements of a live channel. An element has room for the counts of four processors, or for one
+/// state; a type counts up to 65,535.
+inline constexpr std::size_t kLiveElements = 4096;
+
+/// Devices of one kind that are shown live, in the order of their names. Each costs a few files
+/// that are read one by one.
+inline constexpr std::size_t kLiveDevices = 1000;
+
+/// Rows of one table of the kernel that are shown live, such as its network interfaces.
+inline constexpr std::size_t kLiveRows = 20'000;
+
+/// How long a sensor may take to answer, and all sensors together, in milliseconds. Buses with one
+/// wire take up to a second for each.
+inline constexpr int kSensorMilliseconds = 1'000;
+inline constexpr int kSensorsMilliseconds = 4'000;
+
+/// Sensors that may keep a thread waiting at one time. Each of them costs the stack of a thread.
+inline constexpr int kWaitingSensors = 4;
 
 }  // namespace tavrel::limits

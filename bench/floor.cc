@@ -52,7 +52,7 @@ void readScalars(const char* path, const char* day) {
                          nullptr) != SQLITE_OK) {
     fail(sqlite3_errmsg(database));
   }
-  sqlite3_bind_int64(rows, 1, std::atoll(day));
+  sqlite3_bind_int64(rows, 1, std::strtoll(day, nullptr, 10));
   std::int64_t sum = 0;
   while (sqlite3_step(rows) == SQLITE_ROW)
     sum += sqlite3_column_int64(rows, 1) + sqlite3_column_bytes(rows, 0);

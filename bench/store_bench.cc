@@ -3,9 +3,11 @@
 #include <benchmark/benchmark.h>
 #include <cstdint>
 #include <filesystem>
+#include <memory>
 #include <sqlite3.h>
 #include <stdlib.h>
 #include <string>
+#include <vector>
 
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -137,5 +139,67 @@ void appendValues(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * state.range(0));
 }
 BENCHMARK(appendValues)->RangeMultiplier(10)->Range(1000, 1'000'000)->Unit(benchmark::kMillisecond);
+
+/// A fold: many records for each of many keys, in one transaction.
+constexpr std::int64_t kFoldKeys = 1000;
+constexpr std::int64_t kFoldRecords = 1000;  // for each
+
+void fold(benchmark::State& state) {
+  std::vector<DistributionSample> samples;
+  for (std::uint32_t i = 0; i < kFoldRecords; ++i)
+    samples.push_back({i * 0.1, i * 86});
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto device = std::make_unique<Device>();
+    device->fill(1, 1);
+    state.ResumeTiming();
+    auto batch = device->store().beginBatch();
+    bool done = static_cast<bool>(batch);
+    for (std::int64_t key = 0; key < kFoldKeys; ++key)
+      done = done && (*batch)->appendValues(kDay, keyNumber(key), samples);
+    if (!done || !(*batch)->commit()) abort();
+    batch->reset();
+    state.PauseTiming();
+    device.reset();
+    state.ResumeTiming();
+  }
+  state.SetItemsProcessed(state.iterations() * kFoldKeys * kFoldRecords);
+}
+BENCHMARK(fold)->Unit(benchmark::kMillisecond);
+
+/// SQLite alone with the same chunks, which are packed already.
+void foldBySqlite(benchmark::State& state) {
+  const std::string values(kFoldRecords * 8, 'v');
+  const std::string offsets(kFoldRecords * 4, 'o');
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto device = std::make_unique<Device>();
+    sqlite3* const handle = device->plainTable(1);
+    sqlite3_exec(handle,
+                 "PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL; PRAGMA cache_size = -8192;"
+                 "PRAGMA wal_autocheckpoint = 0; CREATE TABLE chunks (chunk INTEGER PRIMARY KEY, "
+                 "data BLOB NOT NULL)",
+                 nullptr, nullptr, nullptr);
+    state.ResumeTiming();
+    sqlite3_exec(handle, "BEGIN IMMEDIATE", nullptr, nullptr, nullptr);
+    sqlite3_stmt* statement = nullptr;
+    sqlite3_prepare_v2(handle, "INSERT INTO chunks (data) VALUES (?1)", -1, &statement, nullptr);
+    for (std::int64_t key = 0; key < kFoldKeys; ++key) {
+      for (const std::string* data : {&values, &offsets}) {
+        sqlite3_bind_blob64(statement, 1, data->data(), data->size(), SQLITE_STATIC);
+        if (sqlite3_step(statement) != SQLITE_DONE) abort();
+        sqlite3_reset(statement);
+      }
+    }
+    sqlite3_finalize(statement);
+    sqlite3_exec(handle, "COMMIT; PRAGMA wal_checkpoint(TRUNCATE)", nullptr, nullptr, nullptr);
+    state.PauseTiming();
+    sqlite3_close(handle);
+    device.reset();
+    state.ResumeTiming();
+  }
+  state.SetItemsProcessed(state.iterations() * kFoldKeys * kFoldRecords);
+}
+BENCHMARK(foldBySqlite)->Unit(benchmark::kMillisecond);
 
 }  // namespace

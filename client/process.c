@@ -24,6 +24,7 @@ static bool findFolder(char folder[kLongestFolder]) {
     --length;
   if (length + sizeof kFolder > kLongestFolder) return false;
   if (length > 0) memcpy(folder, root, length);
+  /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): with its zero */
   memcpy(folder + length, kFolder, sizeof kFolder);
   return true;
 }

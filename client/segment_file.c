@@ -61,8 +61,8 @@ static void makeName(char name[64], unsigned attempt) {
 }
 
 void bhForgetMapping(struct Segment* segment) {
-  mmap(segment, kBHSegmentBytes, PROT_READ | PROT_WRITE,
-       MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED, -1, 0);
+  (void)mmap(segment, kBHSegmentBytes, PROT_READ | PROT_WRITE,
+             MAP_PRIVATE | MAP_ANONYMOUS | MAP_NORESERVE | MAP_FIXED, -1, 0);
 }
 
 static int openFolder(const char* folder) {
@@ -109,11 +109,10 @@ static struct Segment* mapSegment(int file) {
 }
 
 bool bhFetch(const void* from, size_t bytes) {
-  const uintptr_t first = (uintptr_t)from & ~(uintptr_t)4095;
-  const uintptr_t end = (uintptr_t)from + bytes;
+  const size_t before = (uintptr_t)from & 4095U;
   int result;
   do {
-    result = madvise((void*)first, end - first, MADV_POPULATE_WRITE);
+    result = madvise((char*)from - before, before + bytes, MADV_POPULATE_WRITE);
   } while (result != 0 && errno == EINTR);
   return result == 0 || errno == EINVAL;
 }

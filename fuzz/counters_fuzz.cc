@@ -62,7 +62,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   again.elements.fill(0xFFFFFFFF);
   parse(block, counters);
   // Words after 532 are never read.
-  std::fill(block.begin() + 533 * 4, block.end(), std::byte{0xA5});
+  std::fill(block.begin() + std::ptrdiff_t{533} * 4, block.end(), std::byte{0xA5});
   parse(block, again);
   require(counters == again);
   return 0;

@@ -39,7 +39,7 @@ Argument argumentOf(unsigned type, std::uint64_t bits, std::string& text) {
         text += static_cast<char>(bits % 256);
       return text.c_str();
     case 4:
-      return reinterpret_cast<const void*>(bits);
+      return reinterpret_cast<const void*>(bits);  // NOLINT(performance-no-int-to-ptr)
     default:
       return plist::Value(plist::Dictionary{{"bits", word}});
   }

@@ -62,7 +62,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   if (size < 2 || size > tavrel::limits::kPacketBytes) return 0;
   const ByteSpan content = std::as_bytes(std::span(data + 1, size - 1));
   const bool inFile = (data[0] & 1U) != 0;
-  const int seals = kAllSeals & (data[0] & 0xFEU);
+  const int seals = kAllSeals & (data[0] & 0xFE);
 
   tavrel::Descriptor file;
   if (inFile) {

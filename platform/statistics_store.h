@@ -12,7 +12,7 @@
 #include <utility>
 
 #include "base/plist.h"
-#include "platform/distribution_record.h"
+#include "platform/distribution_values.h"
 
 namespace tavrel {
 
@@ -30,43 +30,34 @@ class BHHistoryDistributionEnumerator {
 
   /// True with the next value and its offset in seconds within the day; false when none is left.
   bool getNextValue(double& value, std::uint32_t& secondsInDayOffset) {
-    if (next_ == end_) {
-      const std::string_view records = nextRecords();
-      if (records.empty()) return false;
-      next_ = records.data();
-      end_ = next_ + records.size();
-    }
-    const Sample sample = distributionSampleAt(next_);
-    value = sample.value;
-    secondsInDayOffset = sample.secondsInDayOffset;
-    next_ += kDistributionRecordBytes;
+    if (block_.values.empty()) block_ = nextBlock(true);
+    if (block_.values.empty()) return false;
+    value = packedValueAt(block_.values.data());
+    secondsInDayOffset = packedOffsetAt(block_.offsets.data());
+    block_.values.remove_prefix(kPackedValueBytes);
+    block_.offsets.remove_prefix(kPackedOffsetBytes);
     return true;
   }
 
-  /// The packed records (platform/distribution_record.h) of the next values, for callers that want
-  /// many at once; empty when none is left. They stay valid until the next call.
-  std::string_view nextRecords() {
-    if (next_ != end_) {
-      const char* const first = std::exchange(next_, end_);
-      return {first, static_cast<std::size_t>(end_ - first)};
-    }
-    const std::string_view block = nextBlock();
-    return block.substr(0, block.size() / kDistributionRecordBytes * kDistributionRecordBytes);
+  /// The next values in packed form (platform/distribution_values.h), for callers that want many at
+  /// once and no offsets; empty when none is left. They stay valid until the next call.
+  std::string_view nextValues() {
+    if (!block_.values.empty()) return std::exchange(block_, {}).values;
+    return nextBlock(false).values;
   }
 
   /// True when values are missing because they could not be read; the reason has been reported.
   bool failed() const { return failed_; }
 
  protected:
-  /// The packed records of the next values, whole ones, valid until the next call; empty when none
-  /// is left.
-  virtual std::string_view nextBlock() = 0;
+  /// The next values, with their offsets when those are wanted; valid until the next call. No
+  /// values: none is left.
+  virtual DistributionBlock nextBlock(bool wantsOffsets) = 0;
   /// Call this before `nextBlock` yields nothing because of a failure.
   void fail() { failed_ = true; }
 
  private:
-  const char* next_ = nullptr;
-  const char* end_ = nullptr;
+  DistributionBlock block_;
   bool failed_ = false;
 };
 

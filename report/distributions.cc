@@ -7,13 +7,13 @@ namespace {
 /// Welford's running summary: one pass, constant memory.
 class Summary {
  public:
-  /// Adds the values of packed records and calls `also` with each. A function of its own, so that
-  /// the numbers stay in registers: each value waits for the mean of the one before.
+  /// Adds packed values and calls `also` with each. A function of its own, so that the numbers stay
+  /// in registers: each value waits for the mean of the one before.
   template <class Also>
-  [[gnu::noinline]] void addAll(std::string_view records, Also also) {
+  [[gnu::noinline]] void addAll(std::string_view values, Also also) {
     Summary next = *this;
-    for (; !records.empty(); records.remove_prefix(kDistributionRecordBytes)) {
-      const double value = distributionSampleAt(records.data()).value;
+    for (; !values.empty(); values.remove_prefix(kPackedValueBytes)) {
+      const double value = packedValueAt(values.data());
       next.add(value);
       also(value);
     }
@@ -67,11 +67,11 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
   }
 
   Summary summary;
-  for (auto records = values.nextRecords(); !records.empty(); records = values.nextRecords()) {
+  for (auto block = values.nextValues(); !block.empty(); block = values.nextValues()) {
     if (histogram) {
-      summary.addAll(records, [&](double value) { histogram->count(value); });
+      summary.addAll(block, [&](double value) { histogram->count(value); });
     } else {
-      summary.addAll(records, [](double) {});
+      summary.addAll(block, [](double) {});
     }
   }
 

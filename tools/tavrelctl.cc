@@ -1,8 +1,10 @@
 #include "tools/tavrelctl.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <exception>
 #include <ostream>
+#include <string_view>
 
 #include "base/format.h"
 #include "base/version.h"
@@ -58,25 +60,46 @@ void addGlobalOptions(CLI::App& app, ToolContext& context) {
       ->type_name("DIR");
 }
 
+struct Subcommand {
+  std::string_view name;
+  void (*add)(Command top, ToolContext& context);
+};
+
+// In the order of the help. Making them all takes longer than a short command, so a line that names
+// one of them gets only that.
+constexpr Subcommand kSubcommands[] = {
+    {"status", addStatusCommand},      {"rehearse", addRehearseCommand},
+    {"log", addLogCommands},           {"whitelist", addWhitelistCommands},
+    {"stat", addStatCommands},         {"send", addSendCommands},
+    {"notify", addNotifyCommands},     {"tasking", addTaskingCommands},
+    {"disks", addDisksCommand},        {"nand", addNandCommands},
+    {"nandlog", addNandlogCommands},   {"records", addRecordsCommands},
+    {"prefs", addPrefsCommands},       {"plist", addPlistCommands},
+    {"registry", addRegistryCommands}, {"report", addReportCommands},
+};
+
+// The first argument that is neither an option nor the folder of --root; empty when there is none.
+std::string_view firstWord(const std::vector<std::string>& arguments) {
+  for (std::size_t i = 0; i < arguments.size(); ++i) {
+    if (arguments[i] == "--root") {
+      ++i;
+    } else if (!arguments[i].starts_with('-')) {
+      return arguments[i];
+    }
+  }
+  return {};
+}
+
 void run(const std::vector<std::string>& arguments, ToolContext& context) {
   CLI::App app("Inspects tavrel and the statistics that it reports.", "tavrelctl");
   addGlobalOptions(app, context);
   const Command top(app);
-  addStatusCommand(top, context);
-  addRehearseCommand(top, context);
-  addLogCommands(top, context);
-  addWhitelistCommands(top, context);
-  addStatCommands(top, context);
-  addSendCommands(top, context);
-  addTaskingCommands(top, context);
-  addDisksCommand(top, context);
-  addNandCommands(top, context);
-  addNandlogCommands(top, context);
-  addRecordsCommands(top, context);
-  addPrefsCommands(top, context);
-  addPlistCommands(top, context);
-  addRegistryCommands(top, context);
-  addReportCommands(top, context);
+  const std::string_view named = firstWord(arguments);
+  const bool isNamed = std::ranges::any_of(
+      kSubcommands, [&](const Subcommand& subcommand) { return subcommand.name == named; });
+  for (const Subcommand& subcommand : kSubcommands) {
+    if (!isNamed || subcommand.name == named) subcommand.add(top, context);
+  }
 
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));

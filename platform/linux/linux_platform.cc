@@ -11,6 +11,9 @@
 #include "platform/linux/files/device_file_reader.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/folding/folding_store.h"
+#include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/live/live_machine.h"
 #include "platform/linux/locale/linux_date_formatting.h"
 #include "platform/linux/locale/linux_locale.h"
 #include "platform/linux/logs/file_crash_reporting.h"
@@ -53,6 +56,8 @@ struct LinuxPlatform::Services {
       options.preferences != nullptr ? *options.preferences : filePreferences;
   SqliteStore store{
       root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
+  SegmentFold fold{root, store, fileSystem, propertyLists, log};
+  FoldingStore foldingStore{store, fold, log};
   FileSubmission submission{root,  fileSystem, propertyLists, preferences, systemVersion,
                             clock, log};
   EccEvents eccEvents{root, fileSystem, propertyLists, log,
@@ -68,7 +73,8 @@ struct LinuxPlatform::Services {
   LinuxDateFormatting dateFormatting{root};
   LinuxProcess process;
   LinuxStandardStreams standardStreams{systemLog};
-  RecordedRegistry drivers{root, fileSystem, propertyLists, log};
+  LiveMachine live{root, log};
+  RecordedRegistry drivers{root, fileSystem, propertyLists, log, &live};
   RecordedSnapshots stackSnapshots{root, fileSystem, log};
   ProcessState state;
 
@@ -92,7 +98,7 @@ struct LinuxPlatform::Services {
       .propertyLists = propertyLists,
       .stackSnapshots = stackSnapshots,
       .standardStreams = standardStreams,
-      .statistics = store,
+      .statistics = options.readOnly ? static_cast<StatisticsStore&>(store) : foldingStore,
       .submission = submission,
       .systemControls = systemControls,
       .systemVersion = systemVersion,
@@ -121,6 +127,9 @@ FilePreferences& LinuxPlatform::preferences() {
 }
 FileSubmission& LinuxPlatform::submission() {
   return services_->submission;
+}
+SegmentFold& LinuxPlatform::fold() {
+  return services_->fold;
 }
 RecordedRegistry& LinuxPlatform::registry() {
   return services_->drivers;

@@ -21,6 +21,7 @@ class FilePreferences;
 class FileSubmission;
 class FileSystem;
 class RecordedRegistry;
+class SegmentFold;
 class SqliteStore;
 
 /// How one Linux platform may differ from another. Everything given here must outlive it.
@@ -28,7 +29,8 @@ struct LinuxPlatformOptions {
   SystemLog* log = nullptr;            // in place of the journal or standard error
   FileSystem* fileSystem = nullptr;    // what writes files, in place of its own
   Preferences* preferences = nullptr;  // what the other services read, in place of its own
-  bool readOnly = false;  // a damaged store stays where it is, ECC events stay in their queue
+  /// A damaged store stays where it is, ECC events stay in their queue, nothing is folded.
+  bool readOnly = false;
 };
 
 class LinuxPlatform {
@@ -45,6 +47,7 @@ class LinuxPlatform {
   FileCrashReporting& crashReporting();
   FileSystem& fileSystem();
   FilePreferences& preferences();
+  SegmentFold& fold();
   FileSubmission& submission();
   RecordedRegistry& registry();
   SqliteStore& store();

@@ -88,7 +88,8 @@ class KeyTexts {
  public:
   String of(std::string_view text) {
     if (text.empty()) return {};
-    const std::size_t place = text.size() * 7 + static_cast<unsigned char>(text.front()) * 5U +
+    const std::size_t place = text.size() * 7 +
+                              std::size_t{static_cast<unsigned char>(text.front())} * 5 +
                               static_cast<unsigned char>(text.back());
     String& known = known_[place % known_.size()];
     if (known != text) known = String(text);

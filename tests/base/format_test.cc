@@ -52,7 +52,7 @@ TEST(Format, PrintsAsTheCLibraryDoes) {
                 {0, 1, -1, 255, 1L << 32, LONG_MAX, LONG_MIN});
   compare<double>({"e", "E", "f", "F", "g", "G", "a", "A", "lf"},
                   {0.0, -0.0, 1.0, -1.5, 2.5, 0.1, 1.0 / 3, 99999.95, 999999.5, -1e-5, 1e15, 1e22,
-                   DBL_MAX, DBL_MIN, 4.9e-324, INFINITY, -INFINITY, NAN});
+                   DBL_MAX, DBL_MIN, 4.9e-324, HUGE_VAL, -HUGE_VAL, std::nan("")});
   compare<const char*>({"s"}, {"", "x", "longer than six"});
   compare<int>({"c"}, {'x', '%', 0xE4});
   int local = 0;

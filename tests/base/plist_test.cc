@@ -79,7 +79,7 @@ TEST(Value, EqualityLooksAtKindAndContent) {
       EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
   EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"b", 2.0}, {"a", 1L}}));
   EXPECT_NE(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"a", 1}, {"c", 2}}));
-  EXPECT_EQ(Value(Date::sinceEpoch(NAN)), Value(Date::sinceEpoch(NAN)));
+  EXPECT_EQ(Value(Date::sinceEpoch(std::nan(""))), Value(Date::sinceEpoch(std::nan(""))));
   EXPECT_NE(Value(std::string_view("a\0b", 3)), Value("a"));
 }
 

@@ -1,19 +1,7 @@
-#include <cstdlib>
-
 #include "recording.h"
 
 namespace tavrel {
 namespace {
-
-std::string outputOf(const std::string& command) {
-  FILE* const pipe = popen((command + " 2>&1").c_str(), "r");
-  std::string output;
-  char part[4096];
-  while (const std::size_t size = fread(part, 1, sizeof part, pipe))
-    output.append(part, size);
-  EXPECT_EQ(pclose(pipe), 0) << command << "\n" << output;
-  return output;
-}
 
 TEST_F(Recording, InstalledFilesBuildTheExamples) {
   const std::string to = root / "installed";
@@ -31,13 +19,19 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
            " -DCMAKE_EXE_LINKER_FLAGS='" TAVREL_LINK_FLAGS "' && cmake --build " + to + "/build");
   for (const char* program : {"/c", "/cpp", "/build/record", "/build/record_cpp"})
     EXPECT_EQ(outputOf("LD_LIBRARY_PATH=" + lib + " " + to + program), "");
+  EXPECT_EQ(outputOf("PATH=" TAVREL_BUILD "/bin:$PATH " + examples + "/record.sh"), "");
+  const std::string module = outputOf("find " + to + " -name brimhold.py");
+  const std::string modules = std::filesystem::path(module).parent_path();
+  EXPECT_EQ(outputOf(kPython + "LD_LIBRARY_PATH=" + lib + " PYTHONPATH=" + modules + " " +
+                     examples + "/record.py"),
+            "");
 
   testClock().realtime = 0;
   fold();
   ASSERT_EQ(scalars.size(), 1U);
   EXPECT_EQ(scalars.begin()->first.first, "com.example.starts");
-  EXPECT_EQ(scalars.begin()->second, 4);
-  EXPECT_EQ(records["com.example.seconds"], std::vector<double>(4, 2.5));
+  EXPECT_EQ(scalars.begin()->second, 6);
+  EXPECT_EQ(records["com.example.seconds"], std::vector<double>(6, 2.5));
 
   const std::string library = lib + "/libbrimhold.so.1";
   EXPECT_EQ(

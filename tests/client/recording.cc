@@ -27,6 +27,21 @@ TestClock& testClock() {
   return clock;
 }
 
+std::string outputOf(const std::string& command, int status) {
+  FILE* const pipe = popen(("{ " + command + "; } 2>&1").c_str(), "r");
+  std::string output;
+  char part[4096];
+  while (const std::size_t size = fread(part, 1, sizeof part, pipe))
+    output.append(part, size);
+  EXPECT_EQ(WEXITSTATUS(pclose(pipe)), status) << command << "\n" << output;
+  return output;
+}
+
+const std::string kPython =
+    *TAVREL_LINK_FLAGS == '\0'
+        ? ""
+        : "ASAN_OPTIONS=detect_leaks=0 LD_PRELOAD=$(cc -print-file-name=libasan.so) ";
+
 Recording::Recording() {
   std::string made = "/dev/shm/tavrel-XXXXXX";
   root = mkdtemp(made.data());

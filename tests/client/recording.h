@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <fcntl.h>
 #include <filesystem>
+#include <fstream>
 #include <functional>
 #include <gtest/gtest.h>
 #include <map>
@@ -56,6 +57,13 @@ inline int waitFor(pid_t child) {
 inline void run(const std::function<void()>& program) {
   EXPECT_EQ(waitFor(start(program)), 0);
 }
+
+/// What a command of the shell prints, on both streams. It ends with status 0 unless told
+/// otherwise.
+std::string outputOf(const std::string& command, int status = 0);
+
+/// Before a command of the shell that runs Python: a sanitized library needs its runtime first.
+extern const std::string kPython;
 
 /// A pipe on which one process waits until another has closed or written.
 class Gate {

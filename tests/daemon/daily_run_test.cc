@@ -14,7 +14,7 @@ namespace {
 using plist::Array;
 using plist::Dictionary;
 using Messages = std::vector<std::string>;
-using std::chrono_literals::operator""ms;
+using std::chrono::milliseconds;
 
 constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
@@ -51,7 +51,7 @@ struct DailyRunTest : ::testing::Test {
   void run(std::vector<const char*> arguments) {
     fake.log.entries.clear();
     fake.journal.clear();
-    EXPECT_EQ(runTavrel(fake.platform, arguments, 5ms), 0);
+    EXPECT_EQ(runTavrel(fake.platform, arguments, milliseconds(5)), 0);
   }
 };
 
@@ -194,7 +194,7 @@ TEST_F(DailyRunTest, ServesUntilASliceHasPassedWithoutAnEvent) {
   for (const bool listens : {false, true}) {
     fake.services.available = listens;
     run({"tavrel"});
-    EXPECT_EQ(fake.eventLoop.slices, std::vector{5ms});
+    EXPECT_EQ(fake.eventLoop.slices, std::vector{milliseconds(5)});
     EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "tavrel ended"}));
     fake.eventLoop.slices.clear();
   }

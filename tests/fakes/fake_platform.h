@@ -73,14 +73,14 @@ struct FakePreferences : Preferences {
 struct FakeDistribution : BHHistoryDistributionEnumerator {
   explicit FakeDistribution(const std::vector<double>& values) {
     for (const double value : values)
-      appendDistributionRecord(records, {value, 0});
+      appendPacked(packed, offsets, {{{value, 0}}});
   }
-  std::string records;
+  std::string packed, offsets;
   bool wasRead = false;
   bool fails = false;  // behind the values
 
-  std::string_view nextBlock() override {
-    if (!std::exchange(wasRead, true)) return records;
+  DistributionBlock nextBlock(bool) override {
+    if (!std::exchange(wasRead, true)) return {packed, offsets};
     if (fails) fail();
     return {};
   }
@@ -173,8 +173,8 @@ struct FakeAnswers : DeviceAnswers {
 struct FakeDigest : Digest {
   std::array<std::byte, 16> md5(ByteSpan) override {
     std::array<std::byte, 16> digest{};
-    for (unsigned char i = 0; i < digest.size(); ++i)
-      digest[i] = std::byte{i};
+    for (std::size_t i = 0; i < digest.size(); ++i)
+      digest[i] = static_cast<std::byte>(i);
     return digest;
   }
 };

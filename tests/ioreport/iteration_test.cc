@@ -16,7 +16,7 @@ Dictionary treeOf(std::initializer_list<std::string_view> texts) {
   const Dictionary aggregate = IOReportCreateAggregate(3);
   for (const std::string_view text : texts) {
     const Text group = text[1] == '-' ? Text() : text.substr(1, 1);
-    const auto id = static_cast<std::uint64_t>(text[2]);
+    const auto id = static_cast<unsigned char>(text[2]);
     IOReportAddChannelDescription(aggregate, 7, text.substr(0, 1), id, 1, {}, group, {}, {}, {});
   }
   return aggregate;
@@ -43,7 +43,7 @@ TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
         const Dictionary aggregate =
             isTree ? treeOf({"d-a", "dgb", "dgc", "e-d", "f-e", "f-f"}) : letters("abcdef");
         std::string seen;
-        const auto answer = [&](const Dictionary& channel) {
+        const auto answer = [&, &answers = answers](const Dictionary& channel) {
           seen += IOReportChannelGetChannelName(channel).value_or("?");
           return answers[(seen.size() - 1) % answers.size()];
         };

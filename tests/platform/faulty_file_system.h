@@ -26,7 +26,7 @@ class FaultyFileSystem final : public FileSystem {
                                       Fault::Cut, Fault::CutKeepingNames};
 
   /// What is below `folder` counts as flushed. Calls are counted from 1.
-  FaultyFileSystem(std::string folder, Fault fault, int failingCall)
+  FaultyFileSystem(const std::string& folder, Fault fault, int failingCall)
       : folder_(fs::canonical(folder)), fault_(fault), failingCall_(failingCall) {
     flushNames();
     for (const auto& entry : fs::recursive_directory_iterator(folder_)) {

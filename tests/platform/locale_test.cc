@@ -16,13 +16,21 @@ TEST(LanguageTag, ReadsTagsAndNamesOfLocales) {
     const char* tag;  // empty: no language
     const char* script = "Latn";
   };
-  for (const Case& row :
-       {Case("de_AT.UTF-8@euro", "de-AT"), Case("sr_RS@latin", "sr-Latn-RS"),
-        Case("zh_TW.Big5", "zh-TW", "Hant"), Case("zh-hant-hk", "zh-Hant-HK", "Hant"),
-        Case("tt_RU@iqtelif", "tt-Latn-RU"), Case("ca_ES@valencia", "ca-ES-valencia"),
-        Case("de-CH-1996-u-co-phonebk", "de-CH-1996"), Case("iw_IL", "he-IL", "Hebr"),
-        Case("no_NO", "nb-NO"), Case("C", ""), Case("german", ""), Case("de_", "de"),
-        Case("de_\xff\xff", ""), Case("../../etc", "")}) {
+  const Case cases[] = {{"de_AT.UTF-8@euro", "de-AT"},
+                        {"sr_RS@latin", "sr-Latn-RS"},
+                        {"zh_TW.Big5", "zh-TW", "Hant"},
+                        {"zh-hant-hk", "zh-Hant-HK", "Hant"},
+                        {"tt_RU@iqtelif", "tt-Latn-RU"},
+                        {"ca_ES@valencia", "ca-ES-valencia"},
+                        {"de-CH-1996-u-co-phonebk", "de-CH-1996"},
+                        {"iw_IL", "he-IL", "Hebr"},
+                        {"no_NO", "nb-NO"},
+                        {"C", ""},
+                        {"german", ""},
+                        {"de_", "de"},
+                        {"de_\xff\xff", ""},
+                        {"../../etc", ""}};
+  for (const Case& row : cases) {
     const auto tag = parseLanguageTag(row.name);
     EXPECT_EQ(tag ? tag->text() : "", row.tag) << row.name;
     EXPECT_TRUE(!tag || tag->effectiveScript() == row.script) << row.name;

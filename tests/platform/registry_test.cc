@@ -313,7 +313,7 @@ TEST_F(RegistryTest, TheHubFillsTheBufferInOrderOfInterest) {
   auto registry = std::make_unique<RecordedRegistry>(exampleHub(), log);
   Client client(*registry);
   ASSERT_EQ(client.subscribe(interests(5, {{2, 10}, {5, 5}, {1, 11}, {2, 10}, {1, 10}})), 0U);
-  EXPECT_EQ(client.memory->bytes().size(), std::size_t{64 * 6});
+  EXPECT_EQ(client.memory->bytes().size(), 64U * 6);
   const std::string rest = "0/8000000000000000";
   const Lines updates{"2/a*1=300 1/b*3=200 2/a*1=300 1/a*1=100 ",
                       "2/a*1=301 1/b*1=201 2/a*1=301 1/a*1=100 " + rest + "*2=0 ",
@@ -522,6 +522,21 @@ TEST_F(RecordingFolderTest, IsOneRecordingThatPlaysTheSame) {
   EXPECT_EQ(Value(player.recording()), Value(merged));
   EXPECT_EQ(merged.number("Generation")->int64(), 7);
   EXPECT_EQ(log.lines, Lines{});
+}
+
+TEST(RecordedHubTest, AChannelMayBeAbsentFromAnUpdate) {
+  KeptLog log;
+  const Data absent{ByteSpan()};
+  RecordedRegistry registry(
+      hub({hubChannel(1, 1, Array{absent, group(1, 1, 1, 7), absent}),
+           hubChannel(1, 2, group(1, 2, 1, 8)), hubChannel(1, 3, Array{absent})}),
+      log);
+  Client client(registry);
+  ASSERT_EQ(client.subscribe(interests(2, {{1, 1}, {1, 2}})), kKernelSuccess);
+  EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
+  EXPECT_EQ(client.update(), "1/1*1=7 1/2*1=8 ");
+  EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
+  EXPECT_EQ(log.lines.size(), 1U);  // nothing but absences is no sequence
 }
 
 }  // namespace

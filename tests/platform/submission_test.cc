@@ -20,7 +20,10 @@ struct Service : ProcessServices {
       : ProcessServices(root, fileSystem),
         version(root, fileSystem, coding, log),
         submission(root, fileSystem, coding, preferences, version, clock, log) {}
-  explicit Service(const DeviceRoot& root) : Service(root, files) {}
+  explicit Service(const DeviceRoot& root)
+      : ProcessServices(root),
+        version(root, files, coding, log),
+        submission(root, files, coding, preferences, version, clock, log) {}
 
   bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
     return submission.ZTXWriteLogForSubmission("193", name, options, [](LogFile& file) {

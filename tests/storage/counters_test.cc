@@ -62,7 +62,7 @@ TEST(CountersTest, CopiesByMap) {
   };
   std::vector<std::byte> bytes(kCounterBlockBytes);
   for (std::uint32_t word = 0; word < 1024; ++word)
-    storeLittle32(bytes, word * 4, word + 1);
+    storeLittle32(bytes, std::size_t{word} * 4, word + 1);
   const CounterBlock block(bytes.data(), kCounterBlockBytes);
   TelemetryCounters counters;
   counters.elements.fill(0xFFFFFFFF);

@@ -113,6 +113,7 @@ TEST(NandInfoTest, MapsAllKeys) {
 
   // All statistics at once: all rows but the two of fragments, which no statistic has.
   std::vector<Record> records;
+  records.reserve(std::size(kStatisticKeys));
   for (const StatisticKey& row : kStatisticKeys)
     records.push_back({row.key, std::vector<std::uint64_t>(row.cap, 0x20002)});
   EXPECT_EQ(infoOf(records).size(), 24U + 302 + 5);

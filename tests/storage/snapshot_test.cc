@@ -77,6 +77,7 @@ TEST(Snapshot, RendersWholeRecordsOfTheFixedLayoutAndLikeOnesByDescriptor) {
   EXPECT_EQ(render(records.substr(0, 600)), kKey + "T=0000" + kLine.substr(6) + kLine + "\n");
 
   std::vector<Field> fields;
+  fields.reserve(std::size(kSnapshotRecordFields));
   for (const SnapshotField& field : kSnapshotRecordFields) {
     fields.push_back({static_cast<std::uint32_t>(field.kind) + 1, field.offset, field.triples * 12,
                       field.format.data()});

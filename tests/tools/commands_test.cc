@@ -1,5 +1,7 @@
 // tavrelctl as a whole: usage, preferences, property lists, logs, status.
 #include "device.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
 
 namespace tavrel {
 namespace {
@@ -138,6 +140,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   const TemporaryDevice device;
   fill(device);
   device.run("stat import", "scalar\t-2147483648\tapp.starts\t1\n");
+  LinuxPlatform(device.root).store().BHClientCheckpoint();
   const auto before = device.files();
   const Outcome xml = device.run("log preview --day 20000");
   EXPECT_EQ(xml, prints(xml.out));
@@ -176,6 +179,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
             device.path(kWhitelistFile) + ": No such file or directory"));
 
   fill(device);
+  LinuxPlatform(device.root).store().BHClientCheckpoint();
   device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb",
                "not a database, and long enough to be taken for a damaged one");
   const auto damaged = device.files();
@@ -356,13 +360,13 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   EXPECT_EQ(outcome.status, 0) << outcome;
   for (const auto& line :
        {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
-        "Last OS version  none yet\n", "Store            256.0 KiB, day 20000 (2024-10-04)\n",
+        "Last OS version  none yet\n", " KiB, day 20000 (2024-10-04)\n",
         "Pending logs     1\nLast run         day 20001 (2024-10-05), outcome unknown\n"}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
   }
-  EXPECT_EQ(
-      device.json("status")["store"]["bytes"],
-      std::filesystem::file_size(device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb")));
+  const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");
+  EXPECT_EQ(device.json("status")["store"]["bytes"],
+            std::filesystem::file_size(store) + std::filesystem::file_size(store + "-wal"));
 }
 
 }  // namespace

@@ -264,14 +264,17 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   device.check("stat record d -- -1.5 0x1p-1 -inf", prints(""));
   EXPECT_EQ(device.run("stat record d 2 x").status, 2);
 
-  for (const auto& [key, shown] :
-       {std::pair("", "\"\""), {"a\tb", "a\\tb"}, {"a\nb", "a\\nb"}, {"a\xff", "a\\xff"}}) {
-    for (const char* command : {"set", "add", "record"}) {
-      device.check({"stat", command, key, "1"},
-                   fails(format("not a key: %s: give UTF-8 text without tabs and line ends",
-                                std::string(shown)),
-                         2));
-    }
+  const std::string kControl = ": give text without control characters";
+  for (const auto& [key, fault] :
+       {std::pair(std::string(), std::string("the key is empty: name a statistic, such as "
+                                             "com.example.starts")),
+        {"a\tb", "not a key: a\\tb" + kControl},
+        {"a\nb", "not a key: a\\nb" + kControl},
+        {"a\x7f", "not a key: a\\x7f" + kControl},
+        {"a\xff", "not a key: a\\xff: give UTF-8 text"},
+        {std::string(1025, 'k'), "a key of 1025 bytes: give at most 1024"}}) {
+    for (const char* command : {"set", "add", "record"})
+      device.check({"stat", command, key, "1"}, fails(fault, 2));
   }
 
   EXPECT_EQ(exported(device, "--day yesterday"), "");

@@ -94,24 +94,6 @@ void post(ToolContext& context, const std::string& name) {
   printCount(context, name, *count);
 }
 
-void addNotifyCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("notify", "Notifications");
-  const auto name = std::make_shared<std::string>();
-  const auto timeout = std::make_shared<std::string>();
-
-  const Command waitCommand = group.addCommand("wait", "Wait until a notification is posted");
-  waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging").required();
-  waitCommand.addOption("--timeout", *timeout, "Give up after so long, with exit status 1")
-      .typeName("SECONDS");
-  context.addJsonOption(waitCommand);
-  waitCommand.onRun([&context, name, timeout] { wait(context, *name, *timeout); });
-
-  const Command postCommand = group.addCommand("post", "Post a notification");
-  postCommand.addOption("NAME", *name, "The notification").required();
-  context.addJsonOption(postCommand);
-  postCommand.onRun([&context, name] { post(context, *name); });
-}
-
 }  // namespace
 
 Expected<plist::Array> appDataOf(const plist::Value& applications) {
@@ -168,8 +150,24 @@ void addSendCommands(Command app, ToolContext& context) {
                  "\"uuid\", and \"orbo_id\" and \"arch\" unless 0; - for standard input")
       .required();
   deliverCommand.onRun([&context, file] { deliver(context, *file); });
+}
 
-  addNotifyCommands(app, context);
+void addNotifyCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("notify", "Notifications");
+  const auto name = std::make_shared<std::string>();
+  const auto timeout = std::make_shared<std::string>();
+
+  const Command waitCommand = group.addCommand("wait", "Wait until a notification is posted");
+  waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging").required();
+  waitCommand.addOption("--timeout", *timeout, "Give up after so long, with exit status 1")
+      .typeName("SECONDS");
+  context.addJsonOption(waitCommand);
+  waitCommand.onRun([&context, name, timeout] { wait(context, *name, *timeout); });
+
+  const Command postCommand = group.addCommand("post", "Post a notification");
+  postCommand.addOption("NAME", *name, "The notification").required();
+  context.addJsonOption(postCommand);
+  postCommand.onRun([&context, name] { post(context, *name); });
 }
 
 }  // namespace tavrel

@@ -10,6 +10,7 @@
 namespace tavrel {
 
 void addSendCommands(Command app, ToolContext& context);
+void addNotifyCommands(Command app, ToolContext& context);
 
 /// The "app_data" of a delivery: `applications` as they are written in a file, checked. The error
 /// names the element and the entry that is wrong.

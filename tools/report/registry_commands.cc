@@ -16,6 +16,7 @@
 #include "platform/linux/recorded/typed_fields.h"
 #include "platform/plist/xml.h"
 #include "platform/report_protocol.h"
+#include "tools/report/live_recording.h"
 #include "tools/report/report_selection.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/output_file.h"
@@ -25,9 +26,13 @@
 namespace tavrel {
 namespace {
 
+constexpr std::uint64_t kMostSeconds = 3600;
+
 struct Arguments {
   std::string id;
   std::string file;
+  bool live = false;
+  std::uint32_t seconds = 0;
 };
 
 // The readable recordings. When some are missing, notes have said why, and the exit status is 1.
@@ -40,6 +45,20 @@ CurrentRecording currentRecording(ToolContext& context) {
   const plist::Dictionary content = context.linuxPlatform().registry().recording();
   if (context.hasComplaints()) context.setExitStatus(kExitFailure);
   return {content, !context.hasComplaints()};
+}
+
+// The same with the live services, and the hub that is there for them.
+plist::Dictionary allServices(ToolContext& context) {
+  const plist::Dictionary recorded = currentRecording(context).content;
+  const plist::Array live = context.linuxPlatform().registry().liveServices();
+  if (live.empty()) return recorded;
+  plist::Dictionary all = plist::mutableCopy(recorded);
+  plist::Array services = plist::mutableCopy(recorded.array("Services"));
+  for (const plist::Value& service : live)
+    services.append(service);
+  all.set("Services", services);
+  if (!all.dictionary("Hub")) all.set("Hub", plist::Dictionary{{"EntryID", kLiveHubID}});
+  return all;
 }
 
 // The services of a recording, the hub last.
@@ -71,7 +90,7 @@ void list(ToolContext& context, const Arguments&) {
                {"CHANNELS", Table::Align::Right},
                {"METHODS", Table::Align::Right}});
   Json services = Json::array();
-  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
+  for (const plist::Dictionary& service : servicesOf(allServices(context))) {
     const auto id = wordOf(service.get("EntryID"));
     const std::string_view className = *service.string("Class");
     const std::string_view name = service.string("Name").value_or(className);
@@ -108,7 +127,7 @@ void show(ToolContext& context, const Arguments& arguments) {
     return context.failUsage(
         format("not an entry id: %s: give a 64-bit number, decimal or with 0x", arguments.id));
   }
-  for (const plist::Dictionary& service : servicesOf(currentRecording(context).content)) {
+  for (const plist::Dictionary& service : servicesOf(allServices(context))) {
     if (wordOf(service.get("EntryID")) != *id) continue;
     if (context.json()) return context.printJson({{"service", jsonOf(service)}});
     return printOutline(context.out(), service);
@@ -118,11 +137,18 @@ void show(ToolContext& context, const Arguments& arguments) {
 }
 
 void record(ToolContext& context, const Arguments& arguments) {
-  const auto [recording, isWhole] = currentRecording(context);
-  if (!isWhole) {
+  if (arguments.seconds > 0 && !arguments.live) {
+    return context.failUsage("--seconds is for --live: recordings are written as they stand");
+  }
+  const CurrentRecording current =
+      arguments.live ? CurrentRecording{recordLive(context, arguments.seconds), true}
+                     : currentRecording(context);
+  if (!current.isWhole) {
     return context.fail(format("nothing is written to %s: repair or remove what could not be read",
                                arguments.file));
   }
+  const plist::Dictionary& recording = current.content;
+  if (!recording) return;
   const auto document = plist::writeXml(recording);
   if (!document) {
     return context.fail(
@@ -131,6 +157,12 @@ void record(ToolContext& context, const Arguments& arguments) {
   if (const Status written = writeOutput(context, arguments.file, *document); !written) {
     context.fail(written.error().message);
   }
+}
+
+std::string secondsFault(const std::string& text) {
+  const auto seconds = parseWord(text);
+  if (seconds && *seconds <= kMostSeconds) return {};
+  return format("not a number of seconds: %s: give 0 to %llu", text, kMostSeconds);
 }
 
 Command addCommand(Command group, const char* name, const char* description,
@@ -144,7 +176,7 @@ Command addCommand(Command group, const char* name, const char* description,
 }  // namespace
 
 void addRegistryCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("registry", "Services of the recorded drivers");
+  const Command group = app.addGroup("registry", "Services of recorded and live drivers");
   const auto arguments = std::make_shared<Arguments>();
 
   context.addJsonOption(addCommand(group, "list", "List the services", arguments, context, list));
@@ -154,8 +186,15 @@ void addRegistryCommands(Command app, ToolContext& context) {
   shown.addOption("ID", arguments->id, "Its entry id, decimal or with 0x").required();
   context.addJsonOption(shown);
 
-  const Command recorded =
-      addCommand(group, "record", "Write all recordings as one", arguments, context, record);
+  const Command recorded = addCommand(
+      group, "record", "Write all recordings, or what is live, as one", arguments, context, record);
+  recorded.addFlag("--live", arguments->live,
+                   "What this machine shows now, in place of the recordings");
+  recorded
+      .addOption("--seconds", arguments->seconds,
+                 "With --live: go on for so long, a sample a second (default 0, at most 3600)")
+      .typeName("N")
+      .check(secondsFault);
   recorded
       .addOption("FILE", arguments->file,
                  "Property list to write, in one step; - is standard output")

@@ -12,9 +12,9 @@
 
 #include "base/format.h"
 #include "ioreport/ioreport.h"
-#include "platform/linux/recorded/recording_folder.h"
 #include "tools/report/report_delta.h"
 #include "tools/report/report_json.h"
+#include "tools/report/report_sampler.h"
 #include "tools/report/report_selection.h"
 #include "tools/report/report_view.h"
 #include "tools/shared/noting_platform.h"
@@ -32,67 +32,6 @@ struct Arguments {
   std::uint32_t count = 1;
   bool delta = false;
   bool channelsOnly = false;
-};
-
-Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
-                                             const ReportSelection& selection) {
-  auto channels = selectChannels(noting.platform(), selection);
-  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
-  // For a driver whose channels cannot be read, the notes have only the library's words.
-  if (channels && noting.hasPrinted()) {
-    context.note(
-        "these drivers are left out: 'tavrelctl registry show ID' shows what they publish");
-  }
-  return channels;
-}
-
-// The selected channels and the connection that samples them.
-class Sampler {
- public:
-  /// Says what is wrong when it cannot subscribe.
-  Sampler(ToolContext& context, const ReportSelection& selection)
-      : context_(context), noting_(context) {
-    const auto selected = selectedChannels(context, noting_, selection);
-    if (!selected) {
-      context.fail(selected.error().message);
-      return;
-    }
-    if (IOReportGetChannelCount(*selected) == 0) {
-      context.fail("no such channel is published: 'tavrelctl report list' shows what there is");
-      return;
-    }
-    std::optional<ErrorObject> error;
-    subscription_ = IOReportCreateSubscription(noting_.platform().drivers, nullptr, *selected,
-                                               &subscribed_, 0, &error);
-    if (subscription_) return;
-    const bool isHubMissing = error && error->code == kKernelNotFound && !reasonOf(error);
-    std::string advice(kLookAtDrivers);
-    if (isHubMissing) {
-      advice = format("there is no hub: a recording in %s must have a \"Hub\"", kRecordingFolder);
-    }
-    context.fail(reportFailure("subscribe to the channels", error, advice));
-  }
-
-  explicit operator bool() const { return subscription_ != nullptr; }
-
-  /// An empty handle after a message that says why.
-  plist::Dictionary sample() {
-    std::optional<ErrorObject> error;
-    auto samples = IOReportCreateSamples(subscription_.get(), subscribed_, &error);
-    if (!samples) context_.fail(reportFailure("sample the channels", error));
-    return samples;
-  }
-
-  /// Subscribed channels that have no values.
-  std::int32_t missing(const plist::Dictionary& samples) const {
-    return IOReportGetChannelCount(subscribed_) - IOReportGetChannelCount(samples);
-  }
-
- private:
-  ToolContext& context_;
-  NotingPlatform noting_;
-  plist::Dictionary subscribed_;
-  std::shared_ptr<IOReportSubscription> subscription_;
 };
 
 void list(ToolContext& context, const Arguments& arguments) {
@@ -164,8 +103,9 @@ void sample(ToolContext& context, const Arguments& arguments) {
     if (!samples) return;
     const std::int32_t missing = sampler.missing(samples);
     if (missing != reported) {
-      context.note(format("%s without values: the hub does not know them",
-                          counted(static_cast<std::uint64_t>(missing), "channel")));
+      context.note(format("%s without values: %s",
+                          counted(static_cast<std::uint64_t>(missing), "channel"),
+                          sampler.reasonForMissing()));
       reported = missing;
     }
     const plist::Dictionary shown = previous ? changes.between(previous, samples) : samples;

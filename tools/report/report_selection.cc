@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <charconv>
 #include <iterator>
+#include <unordered_set>
 #include <utility>
 
 #include "base/format.h"
@@ -99,6 +100,8 @@ void addSelectionOptions(Command command, ReportSelection& selection) {
   command
       .addOption("--driver", selection.driver, "Only channels of this driver: its name or its id")
       .typeName("DRIVER");
+  command.addFlag("--live", selection.live, "Only channels of this machine's kernel");
+  command.addFlag("--recorded", selection.recorded, "Only channels of recordings");
 }
 
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection) {
@@ -122,6 +125,19 @@ Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelec
   });
   if (walkFailed(pruned)) return Error{reportFailure("select channels", std::nullopt)};
   return channels;
+}
+
+void keepOrigin(const plist::Dictionary& channels, const ReportSelection& selection,
+                const plist::Array& live) {
+  if (selection.live == selection.recorded) return;
+  std::unordered_set<std::int64_t> drivers;
+  for (const plist::Value& service : live) {
+    if (const auto id = service.dictionary().number("EntryID")) drivers.insert(id->int64());
+  }
+  IOReportPrune(channels, [&](const plist::Dictionary& channel) {
+    const bool isLive = drivers.contains(IOReportChannelGetDriverID(channel));
+    return isLive == selection.live ? kIterateContinue : kIterateRemove;
+  });
 }
 
 std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate) {

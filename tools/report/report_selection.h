@@ -21,8 +21,10 @@ struct ReportSelection {
   std::string subGroup;
   std::string categories;  // a mask; a channel must have one of its categories
   std::string format;
-  std::string unit;    // a label or a number
-  std::string driver;  // its name, with or without the id, or its id
+  std::string unit;       // a label or a number
+  std::string driver;     // its name, with or without the id, or its id
+  bool live = false;      // only of live services
+  bool recorded = false;  // only of recorded ones; with both, of all
 };
 
 void addSelectionOptions(Command command, ReportSelection& selection);
@@ -30,6 +32,10 @@ void addSelectionOptions(Command command, ReportSelection& selection);
 /// The published channels that the selection keeps, filed by driver and group. The error says why
 /// there are none.
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection);
+
+/// Removes the channels that `--live` and `--recorded` exclude; `live` are the live services.
+void keepOrigin(const plist::Dictionary& channels, const ReportSelection& selection,
+                const plist::Array& live);
 
 /// All channels of an aggregate, in its order.
 std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);

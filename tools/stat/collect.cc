@@ -7,18 +7,17 @@
 #include <csignal>
 #include <optional>
 #include <ostream>
+#include <set>
 #include <string>
 #include <vector>
 
 #include "base/arithmetic.h"
-#include "base/civil_time.h"
 #include "base/format.h"
-#include "platform/linux/linux_platform.h"
-#include "platform/linux/store/sqlite_store.h"
-#include "platform/platform.h"
 #include "tools/shared/table.h"
-#include "tools/stat/collect_sources.h"
+#include "tools/stat/collect_state.h"
+#include "tools/stat/machine_statistics.h"
 #include "tools/stat/stat_progress.h"
+#include "tools/stat/value_recorder.h"
 
 namespace tavrel {
 namespace {
@@ -27,222 +26,98 @@ using Ticks = CollectPace::Ticks;
 
 constexpr std::size_t kReadingsPerTransaction = 60;
 
-struct TimedReading {
-  std::int32_t day;
-  std::uint32_t secondsInDay;
-  Ticks at;
-  MachineReading machine;
-};
+// Of the number of processes only the latest is kept.
+constexpr std::uint64_t kReadingsPerCount = 60;
 
-enum class Keeping : std::uint8_t {
-  Latest,  // a scalar, replaced by each reading
-  Sum,     // a scalar, added to by what happened since the reading before
-  Series,  // a distribution, appended to by each reading
-};
-
-// Computes one statistic from a reading and the one before, which is null for the first. Nothing
-// when it is unknown.
-using Measure = std::optional<double> (*)(const MachineReading& now, const MachineReading* before,
-                                          double secondsBetween);
-
-struct Statistic {
-  const char* key;
-  Keeping keeping;
-  Measure measure;
-};
-
-template <class Number>
-std::optional<double> real(const std::optional<Number>& number, double divisor = 1) {
-  if (!number) return std::nullopt;
-  return static_cast<double>(*number) / divisor;
-}
-
-// The growth of a counter. A counter that has gone back was restarted or lost a device, and its
-// growth is unknown.
-std::optional<double> growth(std::uint64_t now, std::uint64_t before) {
-  if (now < before) return std::nullopt;
-  return static_cast<double>(now - before);
-}
-
-using TrafficMember = std::optional<MachineReading::Traffic> MachineReading::*;
-using Direction = std::uint64_t MachineReading::Traffic::*;
-
-template <TrafficMember traffic, Direction direction>
-std::optional<double> kib(const MachineReading& now, const MachineReading* before, double) {
-  if (!before || !(now.*traffic) || !(before->*traffic)) return std::nullopt;
-  const auto bytes = growth((*(now.*traffic)).*direction, (*(before->*traffic)).*direction);
-  return real(bytes, 1024);
-}
-
-template <TrafficMember traffic, Direction direction>
-std::optional<double> kibPerSecond(const MachineReading& now, const MachineReading* before,
-                                   double secondsBetween) {
-  if (secondsBetween <= 0) return std::nullopt;
-  return real(kib<traffic, direction>(now, before, 0), secondsBetween);
-}
-
-std::optional<double> busyTicks(const MachineReading& now, const MachineReading* before, double) {
-  if (!before || !now.cpu || !before->cpu) return std::nullopt;
-  return growth(now.cpu->busy, before->cpu->busy);
-}
-
-std::optional<double> busyPercent(const MachineReading& now, const MachineReading* before, double) {
-  const auto busy = busyTicks(now, before, 0);
-  if (!busy) return std::nullopt;
-  const auto total = growth(now.cpu->total, before->cpu->total);
-  if (!total || *total <= 0) return std::nullopt;
-  return 100 * *busy / *total;
-}
-
-constexpr auto kNetwork = &MachineReading::network;
-constexpr auto kDisk = &MachineReading::disk;
-constexpr auto kIn = &MachineReading::Traffic::in;
-constexpr auto kOut = &MachineReading::Traffic::out;
-
-// One row per statistic. docs/collect.md says what each is; the help text lists the keys.
-constexpr Statistic kStatistics[] = {
-    {"com.norvane.usage.uptime.seconds", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.uptimeSeconds);
-     }},
-    {"com.norvane.usage.cpu.count", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) -> std::optional<double> {
-       if (now.cpus == 0) return std::nullopt;
-       return static_cast<double>(now.cpus);
-     }},
-    {"com.norvane.usage.processes", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) { return real(now.processes); }},
-    {"com.norvane.usage.memory.total_mib", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.memoryTotalKib, 1024);
-     }},
-    {"com.norvane.usage.memory.available_mib", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.memoryAvailableKib, 1024);
-     }},
-    {"com.norvane.usage.swap.used_mib", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.swapUsedKib, 1024);
-     }},
-    {"com.norvane.usage.disk.total_mib", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.diskTotalMib);
-     }},
-    {"com.norvane.usage.disk.free_mib", Keeping::Latest,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.diskFreeMib);
-     }},
-    {"com.norvane.usage.samples", Keeping::Sum,
-     [](const MachineReading&, const MachineReading*, double) { return std::optional<double>(1); }},
-    {"com.norvane.usage.cpu.busy_milliseconds", Keeping::Sum,
-     [](const MachineReading& now, const MachineReading* before, double) {
-       return real(busyTicks(now, before, 0), static_cast<double>(ticksPerSecond()) / 1000);
-     }},
-    {"com.norvane.usage.network.received_kib", Keeping::Sum, kib<kNetwork, kIn>},
-    {"com.norvane.usage.network.sent_kib", Keeping::Sum, kib<kNetwork, kOut>},
-    {"com.norvane.usage.disk.read_kib", Keeping::Sum, kib<kDisk, kIn>},
-    {"com.norvane.usage.disk.written_kib", Keeping::Sum, kib<kDisk, kOut>},
-    {"com.norvane.usage.cpu.busy_percent", Keeping::Series, busyPercent},
-    {"com.norvane.usage.load.one_minute", Keeping::Series,
-     [](const MachineReading& now, const MachineReading*, double) {
-       return real(now.loadOfOneMinute);
-     }},
-    {"com.norvane.usage.memory.used_percent", Keeping::Series,
-     [](const MachineReading& now, const MachineReading*, double) -> std::optional<double> {
-       if (!now.memoryTotalKib || !now.memoryAvailableKib || *now.memoryTotalKib == 0) {
-         return std::nullopt;
-       }
-       return 100 - 100 * static_cast<double>(*now.memoryAvailableKib) /
-                        static_cast<double>(*now.memoryTotalKib);
-     }},
-    {"com.norvane.usage.network.received_kib_per_second", Keeping::Series,
-     kibPerSecond<kNetwork, kIn>},
-    {"com.norvane.usage.network.sent_kib_per_second", Keeping::Series,
-     kibPerSecond<kNetwork, kOut>},
-    {"com.norvane.usage.disk.read_kib_per_second", Keeping::Series, kibPerSecond<kDisk, kIn>},
-    {"com.norvane.usage.disk.written_kib_per_second", Keeping::Series, kibPerSecond<kDisk, kOut>},
-    {"com.norvane.usage.temperature.celsius", Keeping::Series,
-     [](const MachineReading& now, const MachineReading*, double) { return real(now.celsius); }},
-};
-
+// Reads the machine, and computes values from each reading and the one before.
 class Collector {
  public:
-  explicit Collector(ToolContext& context) : context_(context) {}
+  Collector(ToolContext& context, ValueRecorder& recorder)
+      : context_(context), recorder_(recorder) {}
 
-  void read(Ticks at) {
-    Platform& platform = context_.platform();
-    const auto now = saturatingInt64(std::floor(platform.clock->now().secondsSince1970()));
-    readings_.push_back({platform.statistics->BHDaysSince1970(), secondOfDay(now), at,
-                         readMachine(context_.root())});
-    ++count_;
-  }
+  void startFrom(CollectState state) { last_ = std::move(state); }
 
-  /// Writes the waiting readings, except for the last, with which the next one is compared.
-  Status keep() {
-    auto batch = context_.linuxPlatform().store().beginBatch();
-    if (!batch) return batch.error();
-    for (std::size_t i = kept_; i < readings_.size(); ++i) {
-      const TimedReading* const before = i == 0 ? nullptr : &readings_[i - 1];
-      if (Status done = keepReading(**batch, readings_[i], before); !done) return done;
+  void read(std::chrono::nanoseconds at) {
+    const ValueTime time = valueTimeNow();
+    const auto processes =
+        count_ % kReadingsPerCount == 0 ? Processes::Counted : Processes::LeftOut;
+    CollectState now{
+        .at = at, .machine = readMachine(context_.root(), processes), .remainders = {}};
+    const MachineReading* const before = last_ ? &last_->machine : nullptr;
+    const double secondsBetween = last_ ? std::chrono::duration<double>(at - last_->at).count() : 0;
+    if (last_) now.remainders = std::move(last_->remainders);
+    for (const MachineStatistic& statistic : machineStatistics()) {
+      const auto value = statistic.measure(now.machine, before, secondsBetween);
+      if (value) values_.push_back({time, &statistic, kept(statistic, *value, now)});
     }
-    if (Status done = (*batch)->commit(); !done) return done;
-    readings_.erase(readings_.begin(), readings_.end() - 1);
-    kept_ = 1;
-    return Done{};
+    last_ = std::move(now);
+    ++count_;
+    ++waiting_;
   }
 
-  std::size_t waiting() const { return readings_.size() - kept_; }
+  /// Whether it is time to keep the values.
+  bool isFull() const { return recorder_.isInMemory() || waiting_ >= kReadingsPerTransaction; }
+
+  Status keep() {
+    for (const TimedValue& value : values_) {
+      told_.insert(value.statistic->key);
+      if (Status done = keepValue(value); !done) return done;
+    }
+    values_.clear();
+    waiting_ = 0;
+    return recorder_.keep();
+  }
+
+  /// The last reading; there must be one.
+  const CollectState& state() const { return *last_; }
   std::uint64_t count() const { return count_; }
 
   /// Statistics that no reading has given so far, with a blank before each.
   std::string missing() const {
     std::string keys;
-    for (std::size_t i = 0; i < std::size(kStatistics); ++i) {
-      if (!told_[i]) keys.append(" ").append(kStatistics[i].key);
+    for (const MachineStatistic& statistic : machineStatistics()) {
+      if (!told_.contains(statistic.key)) keys.append(" ").append(statistic.key);
     }
     return keys;
   }
 
  private:
-  Status keepReading(SqliteBatch& batch, const TimedReading& now, const TimedReading* before) {
-    const double secondsBetween =
-        before ? std::chrono::duration<double>(now.at - before->at).count() : 0;
-    for (std::size_t i = 0; i < std::size(kStatistics); ++i) {
-      const Statistic& statistic = kStatistics[i];
-      const auto value =
-          statistic.measure(now.machine, before ? &before->machine : nullptr, secondsBetween);
-      if (!value) continue;
-      told_[i] = true;
-      if (Status done = keepValue(batch, now, i, *value); !done) return done;
-    }
-    return Done{};
+  struct TimedValue {
+    ValueTime time;
+    const MachineStatistic* statistic;
+    double value;
+  };
+
+  // The value as it is kept: of a sum the whole part; the rest stays for the next time.
+  static double kept(const MachineStatistic& statistic, double value, CollectState& now) {
+    if (statistic.keeping != Keeping::Sum) return value;
+    double& remainder = now.remainders[statistic.key];
+    const double sum = value + remainder;
+    const double whole = std::floor(sum);
+    remainder = sum - whole;
+    return whole;
   }
 
-  Status keepValue(SqliteBatch& batch, const TimedReading& now, std::size_t statistic,
-                   double value) {
-    const auto& [key, keeping, measure] = kStatistics[statistic];
-    switch (keeping) {
+  Status keepValue(const TimedValue& given) {
+    const auto& [time, statistic, value] = given;
+    switch (statistic->keeping) {
       case Keeping::Latest:
-        return batch.setScalar(now.day, key, saturatingInt64(value));
-      case Keeping::Sum: {
-        // A remainder below one stays for the next time.
-        const double sum = value + fractions_[statistic];
-        const double whole = std::floor(sum);
-        fractions_[statistic] = sum - whole;
-        return batch.addScalar(now.day, key, saturatingInt64(whole));
-      }
+        return recorder_.set(time, statistic->key, saturatingInt64(value));
+      case Keeping::Sum:
+        return recorder_.add(time, statistic->key, saturatingInt64(value));
       case Keeping::Series:
-        return batch.appendValue(now.day, key, now.secondsInDay, value);
+        return recorder_.append(time, statistic->key, value);
     }
     return Done{};
   }
 
   ToolContext& context_;
-  std::vector<TimedReading> readings_;
-  std::size_t kept_ = 0;
+  ValueRecorder& recorder_;
+  std::optional<CollectState> last_;
+  std::vector<TimedValue> values_;
+  std::size_t waiting_ = 0;  // readings
   std::uint64_t count_ = 0;
-  double fractions_[std::size(kStatistics)] = {};
-  bool told_[std::size(kStatistics)] = {};
+  std::set<std::string_view> told_;
 };
 
 // Holds SIGINT and SIGTERM back while it lives, so that what was sampled is kept when they come.
@@ -285,18 +160,20 @@ class EndSignals final : public CollectPace {
 }  // namespace
 
 void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace& pace) {
-  Collector collector(context);
+  const auto recorder = openRecorder(context);
+  if (!recorder) return context.fail(recorder.error().message);
+  Collector collector(context, **recorder);
   const Ticks start = pace.now();
   std::uint32_t second = 0;
   bool endsEarly = false;
   {
     StatProgress progress(context);
     for (;; ++second) {
-      collector.read(pace.now());
+      collector.read(pace.now().time_since_epoch());
       progress.show(format("collecting: %u of %u seconds", second, seconds));
       endsEarly = second < seconds && pace.endsBefore(start + std::chrono::seconds(second + 1));
       const bool isLast = second == seconds || endsEarly;
-      if (!isLast && collector.waiting() < kReadingsPerTransaction) continue;
+      if (!isLast && !collector.isFull()) continue;
       if (const Status kept = collector.keep(); !kept) return context.fail(kept.error().message);
       if (isLast) break;
     }
@@ -315,16 +192,27 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
   collectStatistics(context, seconds, signals);
 }
 
-std::string_view collectedKeysHelp() {
-  return "Scalars, under com.norvane.usage.:\n"
-         "  uptime.seconds, cpu.count, processes, memory.total_mib, memory.available_mib,\n"
-         "  swap.used_mib, disk.total_mib, disk.free_mib (the latest reading);\n"
-         "  samples, cpu.busy_milliseconds, network.received_kib, network.sent_kib,\n"
-         "  disk.read_kib, disk.written_kib (added up over the day's readings)\n"
-         "Distributions, under com.norvane.usage.:\n"
-         "  cpu.busy_percent, load.one_minute, memory.used_percent,\n"
-         "  network.received_kib_per_second, network.sent_kib_per_second,\n"
-         "  disk.read_kib_per_second, disk.written_kib_per_second, temperature.celsius";
+void collectOnce(ToolContext& context, const std::string& stateFile) {
+  const std::string path =
+      stateFile.empty() ? context.root().path("/run/tavrel/collect.state") : stateFile;
+  const std::string boot = bootIdentity(context.root());
+  const std::chrono::nanoseconds now = std::chrono::steady_clock::now().time_since_epoch();
+  auto before = readCollectState(path, boot, now);
+  const auto recorder = openRecorder(context);
+  if (!recorder) return context.fail(recorder.error().message);
+  Collector collector(context, **recorder);
+  if (!before) {
+    context.note(format("this sample has no rates: %s", before.error().message));
+  } else if (*before) {
+    collector.startFrom(std::move(**before));
+  }
+  collector.read(now);
+  // The state comes first: when the run is killed before it has kept the values, those are lost.
+  // The other way the next run would count them again.
+  Status done = writeCollectState(path, boot, collector.state());
+  if (!done) return context.fail(done.error().message);
+  done = collector.keep();
+  if (!done) context.fail(done.error().message);
 }
 
 }  // namespace tavrel

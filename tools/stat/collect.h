@@ -3,7 +3,7 @@
 
 #include <chrono>
 #include <cstdint>
-#include <string_view>
+#include <string>
 
 #include "tools/shared/tool_context.h"
 
@@ -20,14 +20,16 @@ class CollectPace {
   virtual bool endsBefore(Ticks end) = 0;
 };
 
-/// Reads the machine now and once a second for `seconds`, and keeps what it read in the statistics
-/// of the day of each reading. Readings are kept once a minute and at the end.
+/// Reads the machine now and once a second for `seconds`, and records what it read for the day of
+/// each reading. Without a folder for recording in memory, readings go into the store once a minute
+/// and at the end.
 void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace& pace);
 
 /// The same by this machine's clock, until SIGINT or SIGTERM comes.
 void collectStatistics(ToolContext& context, std::uint32_t seconds);
 
-/// The keys that are recorded, with their units, for people.
-std::string_view collectedKeysHelp();
+/// Reads the machine once. Rates and sums span the time since the last such run, whose reading is
+/// in `stateFile`; an empty name is the device's own.
+void collectOnce(ToolContext& context, const std::string& stateFile);
 
 }  // namespace tavrel

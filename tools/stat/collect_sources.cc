@@ -1,20 +1,52 @@
 #include "tools/stat/collect_sources.h"
 
 #include <charconv>
+#include <dirent.h>
+#include <fcntl.h>
 #include <filesystem>
-#include <fstream>
-#include <iterator>
+#include <memory>
 #include <string>
 #include <sys/statvfs.h>
 #include <unistd.h>
 #include <vector>
 
+#include "platform/linux/files/descriptor.h"
+
 namespace tavrel {
 namespace {
 
+// Bytes of a file in /proc or /sys. Those of machines with hundreds of CPUs have some 100 KiB.
+constexpr std::size_t kLargestFile = 1U << 20;
+
+// Empty when it cannot be read.
+std::string contentOf(const std::string& path) {
+  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  std::string content;
+  if (!file) return content;
+  char part[4096];
+  for (ssize_t size = 0; (size = read(file.get(), part, sizeof part)) > 0;) {
+    content.append(part, static_cast<std::size_t>(size));
+    if (content.size() > kLargestFile) return {};
+  }
+  return content;
+}
+
 std::string contentOf(const DeviceRoot& root, std::string_view devicePath) {
-  std::ifstream stream(root.pathOrMachine(devicePath), std::ios::binary);
-  return {std::istreambuf_iterator<char>(stream), {}};
+  return contentOf(root.pathOrMachine(devicePath));
+}
+
+// Hands the names in a folder to `take`.
+template <class Take>
+void eachName(const std::string& folder, Take take) {
+  const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), closedir);
+  if (!entries) return;
+  while (const dirent* const entry = readdir(entries.get()))
+    take(std::string_view(entry->d_name));
+}
+
+// Block devices of the kernel's own, which have no device behind them; there may be many.
+bool isVirtualDisk(std::string_view name) {
+  return name.starts_with("loop") || name.starts_with("ram") || name.starts_with("zram");
 }
 
 std::string_view takeLine(std::string_view& text) {
@@ -128,9 +160,9 @@ std::optional<MachineReading::Traffic> readDisks(const DeviceRoot& root) {
   while (!rest.empty()) {
     const auto fields = fieldsOf(takeLine(rest));
     if (fields.size() <= kWritten) continue;
+    if (isVirtualDisk(fields[kName])) continue;
     const std::string device = "/sys/block/" + std::string(fields[kName]) + "/device";
-    std::error_code ignored;
-    if (!std::filesystem::exists(root.pathOrMachine(device), ignored)) continue;
+    if (access(root.pathOrMachine(device).c_str(), F_OK) != 0) continue;
     const auto in = numberOf<std::uint64_t>(fields[kRead]);
     const auto out = numberOf<std::uint64_t>(fields[kWritten]);
     if (!in || !out) continue;
@@ -144,27 +176,23 @@ std::optional<MachineReading::Traffic> readDisks(const DeviceRoot& root) {
 // Thermal zones give thousandths of a degree.
 std::optional<double> readTemperature(const DeviceRoot& root) {
   std::optional<double> hottest;
-  std::error_code code;
-  std::filesystem::directory_iterator zones(root.pathOrMachine("/sys/class/thermal"), code);
-  for (; !code && zones != std::filesystem::directory_iterator(); zones.increment(code)) {
-    if (!zones->path().filename().string().starts_with("thermal_zone")) continue;
-    std::ifstream stream(zones->path() / "temp");
-    std::int64_t thousandths = 0;
-    if (!(stream >> thousandths)) continue;
-    const double celsius = static_cast<double>(thousandths) / 1000;
+  const std::string folder = root.pathOrMachine("/sys/class/thermal");
+  eachName(folder, [&](std::string_view name) {
+    if (!name.starts_with("thermal_zone")) return;
+    const std::string text = contentOf(folder + '/' + std::string(name) + "/temp");
+    const auto thousandths = firstNumber<std::int64_t>(text);
+    if (!thousandths) return;
+    const double celsius = static_cast<double>(*thousandths) / 1000;
     if (!hottest || celsius > *hottest) hottest = celsius;
-  }
+  });
   return hottest;
 }
 
 std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
-  std::error_code code;
   std::uint64_t count = 0;
-  std::filesystem::directory_iterator entries(root.pathOrMachine("/proc"), code);
-  for (; !code && entries != std::filesystem::directory_iterator(); entries.increment(code)) {
-    const std::string name = entries->path().filename();
-    if (name.find_first_not_of("0123456789") == std::string::npos) ++count;
-  }
+  eachName(root.pathOrMachine("/proc"), [&](std::string_view name) {
+    if (name.find_first_not_of("0123456789") == std::string_view::npos) ++count;
+  });
   if (count == 0) return std::nullopt;
   return count;
 }
@@ -184,11 +212,11 @@ void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
 
 }  // namespace
 
-MachineReading readMachine(const DeviceRoot& root) {
+MachineReading readMachine(const DeviceRoot& root, Processes processes) {
   MachineReading reading;
   reading.uptimeSeconds = firstNumber<double>(contentOf(root, "/proc/uptime"));
   reading.loadOfOneMinute = firstNumber<double>(contentOf(root, "/proc/loadavg"));
-  reading.processes = countProcesses(root);
+  if (processes == Processes::Counted) reading.processes = countProcesses(root);
   readCpu(root, reading);
   readMemory(root, reading);
   reading.network = readNetwork(root);

@@ -46,8 +46,11 @@ struct MachineReading {
   std::optional<std::uint64_t> diskFreeMib;
 };
 
+/// Counting processes takes the kernel longer than all the rest.
+enum class Processes : std::uint8_t { Counted, LeftOut };
+
 /// Files below the root take the place of the machine's own.
-MachineReading readMachine(const DeviceRoot& root);
+MachineReading readMachine(const DeviceRoot& root, Processes processes);
 
 /// Ticks per second in which the kernel counts CPU time.
 std::int64_t ticksPerSecond();

@@ -1,24 +1,15 @@
 #include "tools/stat/stat_commands.h"
 
 #include <charconv>
-#include <cmath>
-#include <limits>
 #include <memory>
-#include <nlohmann/json.hpp>
-#include <ostream>
-#include <vector>
 
-#include "base/arithmetic.h"
-#include "base/civil_time.h"
 #include "base/format.h"
-#include "platform/linux/linux_platform.h"
-#include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 #include "tools/stat/collect.h"
-#include "tools/stat/import_lines.h"
-#include "tools/stat/import_number.h"
+#include "tools/stat/machine_statistics.h"
+#include "tools/stat/record_commands.h"
+#include "tools/stat/stat_fold.h"
 #include "tools/stat/stat_list.h"
 #include "tools/stat/stat_show.h"
 #include "tools/stat/stat_transfer.h"
@@ -29,65 +20,12 @@ namespace {
 struct Arguments {
   std::string file = "-";
   std::string key;
-  std::string number;
-  std::vector<std::string> values;
   std::string day;
   std::uint32_t seconds = 5;
+  bool once = false;
+  std::string stateFile;
   std::optional<std::uint32_t> days;
 };
-
-// Changes the store in one transaction.
-template <class Change>
-void change(ToolContext& context, Change change) {
-  auto batch = context.linuxPlatform().store().beginBatch();
-  if (!batch) return context.fail(batch.error().message);
-  Status done = change(**batch);
-  if (done) done = (*batch)->commit();
-  if (!done) context.fail(done.error().message);
-}
-
-// A key that the export could not write is a mistake. False after a message that says so.
-bool checkKey(ToolContext& context, const std::string& key) {
-  if (isExportable(key)) return true;
-  context.failUsage(format("not a key: %s: give UTF-8 text without tabs and line ends",
-                           key.empty() ? "\"\"" : std::string_view(key).substr(0, 60)));
-  return false;
-}
-
-// Sets or adds to today's value of a scalar.
-template <Status (SqliteBatch::*operation)(std::int32_t, std::string_view, std::int64_t)>
-void changeScalar(ToolContext& context, const Arguments& arguments) {
-  if (!checkKey(context, arguments.key)) return;
-  std::int64_t number = 0;
-  const char* const end = arguments.number.data() + arguments.number.size();
-  const auto [stop, error] = std::from_chars(arguments.number.data(), end, number);
-  if (error != std::errc() || stop != end) {
-    return context.failUsage(format("not a 64-bit integer: %s", arguments.number));
-  }
-  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  change(context,
-         [&](SqliteBatch& batch) { return (batch.*operation)(today, arguments.key, number); });
-}
-
-void record(ToolContext& context, const Arguments& arguments) {
-  if (!checkKey(context, arguments.key)) return;
-  std::vector<double> values;
-  for (const std::string& text : arguments.values) {
-    const auto value = parseExactDouble(text);
-    if (!value) return context.failUsage(value.error().message);
-    values.push_back(*value);
-  }
-  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  const double now = context.platform().clock->now().secondsSince1970();
-  const std::uint32_t seconds = secondOfDay(saturatingInt64(std::floor(now)));
-  change(context, [&](SqliteBatch& batch) {
-    Status done = Done{};
-    for (std::size_t i = 0; done && i < values.size(); ++i) {
-      done = batch.appendValue(today, arguments.key, seconds, values[i]);
-    }
-    return done;
-  });
-}
 
 // A day from the command line. False, after a message, when it is not one.
 bool parseDayOption(ToolContext& context, const std::string& text,
@@ -160,23 +98,7 @@ void addStatCommands(Command app, ToolContext& context) {
                  });
   addSelection(exported, *arguments);
 
-  const Command set = addCommand(group, "set", "Set today's value of a scalar", arguments, context,
-                                 changeScalar<&SqliteBatch::setScalar>);
-  addKey(set, *arguments);
-  set.addOption("N", arguments->number, "64-bit integer").required();
-
-  const Command add = addCommand(group, "add", "Add to today's value of a scalar", arguments,
-                                 context, changeScalar<&SqliteBatch::addScalar>);
-  addKey(add, *arguments);
-  add.addOption("N", arguments->number, "64-bit integer").required();
-
-  const Command recorded = addCommand(group, "record", "Append values to today's distribution",
-                                      arguments, context, record);
-  addKey(recorded, *arguments);
-  recorded
-      .addOption("VALUE", arguments->values,
-                 "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
-      .required();
+  addRecordCommands(group, context);
 
   const Command listed =
       addCommand(group, "list", "List the content of the store by day", arguments, context,
@@ -186,6 +108,11 @@ void addStatCommands(Command app, ToolContext& context) {
                  });
   addSelection(listed, *arguments);
   context.addJsonOption(listed);
+
+  const Command folded =
+      addCommand(group, "fold", "Move what programs recorded into the store", arguments, context,
+                 [](ToolContext& tool, const Arguments&) { foldStatistics(tool); });
+  context.addJsonOption(folded);
 
   const Command shown =
       addCommand(group, "show", "Show one statistic: its values by day, and what they come to",
@@ -198,12 +125,24 @@ void addStatCommands(Command app, ToolContext& context) {
       .check(daysFault);
   context.addJsonOption(shown);
 
-  const Command collected = addCommand(
-      group, "collect", "Sample this machine once a second into today's statistics", arguments,
-      context,
-      [](ToolContext& tool, const Arguments& given) { collectStatistics(tool, given.seconds); });
-  collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
-      .typeName("N");
+  const Command collected =
+      addCommand(group, "collect", "Sample this machine once a second into today's statistics",
+                 arguments, context, [](ToolContext& tool, const Arguments& given) {
+                   if (given.once) return collectOnce(tool, given.stateFile);
+                   if (!given.stateFile.empty()) return tool.failUsage("--state needs --once");
+                   collectStatistics(tool, given.seconds);
+                 });
+  const Option seconds =
+      collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
+          .typeName("N");
+  collected
+      .addFlag("--once", arguments->once,
+               "Take one sample, with rates since the last run of this kind")
+      .excludes(seconds);
+  collected
+      .addOption("--state", arguments->stateFile,
+                 "What --once leaves for the next run (default /run/tavrel/collect.state)")
+      .typeName("FILE");
   collected.setFooter(std::string(collectedKeysHelp()));
 }
 

@@ -2,16 +2,15 @@
 
 #include <algorithm>
 #include <charconv>
-#include <limits>
 #include <nlohmann/json.hpp>
 #include <string_view>
 #include <vector>
 
 #include "base/utf8.h"
-#include "platform/linux/store/sqlite_store.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
 #include "tools/stat/line_writer.h"
+#include "tools/stat/recorded.h"
 
 namespace tavrel {
 namespace {
@@ -22,12 +21,6 @@ constexpr std::size_t kBytesMeasured = 256U << 10;
 
 constexpr std::string_view kNumbers = "-9223372036854775808";
 constexpr std::string_view kDistribution = "distribution";
-
-struct Selection {
-  std::string prefix;
-  std::int32_t first;
-  std::int32_t last;
-};
 
 bool isPlain(std::string_view text) {
   return std::all_of(text.begin(), text.end(),
@@ -224,11 +217,9 @@ class JsonWriter {
 
 // Passes each row to `add`, scalars first, and calls `between` after the scalars.
 template <class Add, class Between>
-Status walk(SqliteHistory& history, const Selection& selection, LineWriter& lines, Add add,
-            Between between) {
+Status walk(RecordedHistory& history, LineWriter& lines, Add add, Between between) {
   bool goesOn = true;
   Status walked = history.walkScalars(
-      selection.prefix, selection.first, selection.last,
       [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
         add(Row{true, day, value, key});
         goesOn = lines.flushIfLarge();
@@ -236,15 +227,14 @@ Status walk(SqliteHistory& history, const Selection& selection, LineWriter& line
       });
   between();
   if (!walked || !goesOn) return walked;
-  return history.walkDistributions(selection.prefix, selection.first, selection.last,
-                                   [&](std::string_view key, std::int32_t day, std::int64_t count,
+  return history.walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t count,
                                        BHHistoryDistributionEnumerator&, bool& stop) {
-                                     add(Row{false, day, count, key});
-                                     stop = !lines.flushIfLarge();
-                                   });
+    add(Row{false, day, count, key});
+    stop = !lines.flushIfLarge();
+  });
 }
 
-Status printTable(ToolContext& context, SqliteHistory& history, const Selection& selection) {
+Status printTable(ToolContext& context, RecordedHistory& history) {
   const auto span = history.daysHeld();
   if (!span) return span.error();
   std::size_t widestDay = 0;
@@ -254,12 +244,12 @@ Status printTable(ToolContext& context, SqliteHistory& history, const Selection&
   LineWriter lines(context.out());
   TableWriter table(lines, context.columns(), widestDay);
   const Status walked = walk(
-      history, selection, lines, [&](const Row& row) { table.add(row); }, [] {});
+      history, lines, [&](const Row& row) { table.add(row); }, [] {});
   if (!table.finish() && walked) lines.buffer() += "no statistics\n";
   return walked;
 }
 
-Status printJson(ToolContext& context, SqliteHistory& history, const Selection& selection) {
+Status printJson(ToolContext& context, RecordedHistory& history) {
   LineWriter lines(context.out());
   JsonWriter json(lines);
   std::string head = jsonText(withFormatVersion(Json::object()), 2);
@@ -267,7 +257,7 @@ Status printJson(ToolContext& context, SqliteHistory& history, const Selection& 
   lines.buffer() += head;
   json.beginList("scalars");
   const Status walked = walk(
-      history, selection, lines, [&](const Row& row) { json.add(row); },
+      history, lines, [&](const Row& row) { json.add(row); },
       [&] {
         json.endList();
         json.beginList("distributions");
@@ -281,12 +271,13 @@ Status printJson(ToolContext& context, SqliteHistory& history, const Selection& 
 
 void listStatistics(ToolContext& context, const std::string& prefix,
                     std::optional<std::int32_t> day) {
-  const auto history = context.storeForReading().openHistory();
+  auto history = openRecorded(context, {.key = prefix,
+                                        .firstDay = day.value_or(kFirstDay),
+                                        .lastDay = day.value_or(kLastDay),
+                                        .hasValues = false});
   if (!history) return context.fail(history.error().message);
-  const Selection selection{prefix, day.value_or(std::numeric_limits<std::int32_t>::min()),
-                            day.value_or(std::numeric_limits<std::int32_t>::max())};
-  const Status listed = context.json() ? printJson(context, **history, selection)
-                                       : printTable(context, **history, selection);
+  const Status listed =
+      context.json() ? printJson(context, *history) : printTable(context, *history);
   if (!listed) context.fail(listed.error().message);
 }
 

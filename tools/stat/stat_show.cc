@@ -2,19 +2,19 @@
 
 #include <algorithm>
 #include <functional>
-#include <limits>
 #include <nlohmann/json.hpp>
 #include <ostream>
+#include <utility>
 #include <vector>
 
 #include "base/format.h"
-#include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
+#include "tools/stat/recorded.h"
 #include "tools/stat/value_summary.h"
 
 namespace tavrel {
@@ -41,36 +41,27 @@ struct Statistic {
   std::vector<DistributionView::Bucket> buckets;
 };
 
-struct Days {
-  std::int32_t first = std::numeric_limits<std::int32_t>::min();
-  std::int32_t last = std::numeric_limits<std::int32_t>::max();
-};
-
-Status forEachValue(SqliteHistory& history, const std::string& key, Days days,
+Status forEachValue(RecordedHistory& history,
                     const std::function<void(std::int32_t day, double value)>& take) {
-  return history.walkDistribution(key, days.first, days.last,
-                                  [&](std::string_view, std::int32_t day, std::int64_t,
-                                      BHHistoryDistributionEnumerator& values, bool&) {
-                                    double value = 0;
-                                    std::uint32_t seconds = 0;
-                                    while (values.getNextValue(value, seconds))
-                                      take(day, value);
-                                  });
+  return history.walkDistributions([&](std::string_view, std::int32_t day, std::int64_t,
+                                       BHHistoryDistributionEnumerator& values, bool&) {
+    double value = 0;
+    std::uint32_t seconds = 0;
+    while (values.getNextValue(value, seconds))
+      take(day, value);
+  });
 }
 
-Expected<Statistic> readStatistic(SqliteHistory& history, const std::string& key, Days days) {
+Expected<Statistic> readStatistic(RecordedHistory& history, const std::string& key) {
   Statistic statistic;
   statistic.key = key;
-  // The values are read several times and must not change in between.
-  if (Status begun = history.beginSnapshot(); !begun) return begun.error();
   Status read =
-      history.walkScalar(key, days.first, days.last,
-                         [&](std::string_view, std::int32_t day, std::int64_t value, bool&) {
-                           statistic.scalarDays.push_back({day, value});
-                         });
+      history.walkScalars([&](std::string_view, std::int32_t day, std::int64_t value, bool&) {
+        statistic.scalarDays.push_back({day, value});
+      });
   if (!read) return read.error();
   auto& perDay = statistic.distributionDays;
-  read = forEachValue(history, key, days, [&](std::int32_t day, double value) {
+  read = forEachValue(history, [&](std::int32_t day, double value) {
     if (perDay.empty() || perDay.back().day != day) perDay.push_back({day, {}});
     perDay.back().summary.add(value);
     statistic.summary.add(value);
@@ -81,7 +72,7 @@ Expected<Statistic> readStatistic(SqliteHistory& history, const std::string& key
   RoundHistogram histogram(statistic.summary);
   PercentileSearch search(statistic.summary.numbers(), kPercents);
   for (bool isFirstPass = true; search.needsPass(); isFirstPass = false) {
-    read = forEachValue(history, key, days, [&](std::int32_t, double value) {
+    read = forEachValue(history, [&](std::int32_t, double value) {
       if (isFirstPass) histogram.add(value);
       search.add(value);
     });
@@ -202,15 +193,15 @@ void printDistribution(ToolContext& context, const Statistic& statistic) {
 
 void showStatistic(ToolContext& context, const std::string& key,
                    std::optional<std::uint32_t> days) {
-  Days range;
+  RowSelection selection{.key = key, .isPrefix = false, .firstDay = kFirstDay, .lastDay = kLastDay};
   if (days) {
-    range.last = context.platform().statistics->BHDaysSince1970();
-    range.first = static_cast<std::int32_t>(
-        std::max(std::int64_t{range.last} - *days + 1, std::int64_t{range.first}));
+    selection.lastDay = context.platform().statistics->BHDaysSince1970();
+    selection.firstDay = static_cast<std::int32_t>(
+        std::max(std::int64_t{selection.lastDay} - *days + 1, std::int64_t{kFirstDay}));
   }
-  const auto history = context.storeForReading().openHistory();
+  auto history = openRecorded(context, std::move(selection));
   if (!history) return context.fail(history.error().message);
-  const auto statistic = readStatistic(**history, key, range);
+  const auto statistic = readStatistic(*history, key);
   if (!statistic) return context.fail(statistic.error().message);
   const bool hasScalar = !statistic->scalarDays.empty();
   const bool hasDistribution = !statistic->distributionDays.empty();

@@ -4,7 +4,6 @@
 #include <cstring>
 #include <fstream>
 #include <istream>
-#include <limits>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <string_view>
@@ -17,6 +16,7 @@
 #include "tools/shared/table.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/line_writer.h"
+#include "tools/stat/recorded.h"
 #include "tools/stat/stat_progress.h"
 
 namespace tavrel {
@@ -84,10 +84,10 @@ void importStatistics(ToolContext& context, const std::string& file) {
 
 void exportStatistics(ToolContext& context, const std::string& prefix,
                       std::optional<std::int32_t> day) {
-  const auto history = context.storeForReading().openHistory();
+  auto history = openRecorded(
+      context,
+      {.key = prefix, .firstDay = day.value_or(kFirstDay), .lastDay = day.value_or(kLastDay)});
   if (!history) return context.fail(history.error().message);
-  const std::int32_t first = day.value_or(std::numeric_limits<std::int32_t>::min());
-  const std::int32_t last = day.value_or(std::numeric_limits<std::int32_t>::max());
 
   StatProgress progress(context);
   LineWriter writer(context.out());
@@ -101,26 +101,23 @@ void exportStatistics(ToolContext& context, const std::string& prefix,
         printable(key.substr(0, 60))));
     return false;
   };
-  Status walked = (*history)->walkScalars(
-      prefix, first, last,
+  Status walked = history->walkScalars(
       [&](std::string_view key, std::int32_t rowDay, std::int64_t value, bool& stop) {
         if (!canBeWritten(key)) return;
         appendScalarLine(writer.buffer(), rowDay, key, value);
         stop = !writer.flushIfLarge();
       });
   if (walked) {
-    walked = (*history)->walkDistributions(
-        prefix, first, last,
-        [&](std::string_view key, std::int32_t rowDay, std::int64_t,
-            BHHistoryDistributionEnumerator& values, bool& stop) {
-          if (!canBeWritten(key)) return;
-          double value = 0;
-          std::uint32_t seconds = 0;
-          while (!stop && values.getNextValue(value, seconds)) {
-            appendValueLine(writer.buffer(), rowDay, key, seconds, value);
-            stop = !writer.flushIfLarge();
-          }
-        });
+    walked = history->walkDistributions([&](std::string_view key, std::int32_t rowDay, std::int64_t,
+                                            BHHistoryDistributionEnumerator& values, bool& stop) {
+      if (!canBeWritten(key)) return;
+      double value = 0;
+      std::uint32_t seconds = 0;
+      while (!stop && values.getNextValue(value, seconds)) {
+        appendValueLine(writer.buffer(), rowDay, key, seconds, value);
+        stop = !writer.flushIfLarge();
+      }
+    });
     if (context.hasComplaints()) context.setExitStatus(kExitFailure);
   }
   if (!walked) context.fail(walked.error().message);

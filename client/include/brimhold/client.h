@@ -9,8 +9,8 @@
  *
  * Purpose. A scalar is a number per UTC day: counts are added, gauges are set. A distribution is a
  * series of measurements, each kept with its second. The system folds what programs record into
- * its statistics store and reports what its whitelist names. In this version nothing folds yet:
- * what programs record waits in memory.
+ * its statistics store, every hour and when a segment fills up, and reports what its whitelist
+ * names. `tavrelctl stat show KEY` shows a value at once.
  *
  * Cost. An add or a record is a few nanoseconds: a clock read and an atomic add in memory. There
  * is no daemon, no lock and no write to flash. A process that records takes 20 KiB of memory, and

@@ -54,7 +54,15 @@ const char* HubChannels::addOne(const plist::Dictionary& channel) {
     return isGroupOf(group.data().bytes(), *driverID, *channelID);
   };
   bool isWhole = isGroup(elements);
-  if (groups) isWhole = !groups.empty() && std::all_of(groups.begin(), groups.end(), isGroup);
+  if (groups) {
+    const auto isAbsent = [](const plist::Value& group) {
+      return group.data() && group.data().size() == 0;
+    };
+    isWhole = std::any_of(groups.begin(), groups.end(), isGroup) &&
+              std::all_of(groups.begin(), groups.end(), [&](const plist::Value& group) {
+                return isAbsent(group) || isGroup(group);
+              });
+  }
   if (!isWhole) {
     return "its \"Elements\" are not groups of this channel; give elements of 64 bytes with its "
            "ids, the "

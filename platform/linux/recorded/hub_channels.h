@@ -19,7 +19,8 @@ class HubChannel {
  public:
   explicit HubChannel(plist::Value elements);
 
-  /// The group that update number `update` shows, from 0. The last one stays.
+  /// The group that update number `update` shows, from 0; empty where the channel was absent. The
+  /// last one stays.
   ByteSpan group(std::size_t update) const;
   std::size_t largestGroup() const { return largest_; }
 

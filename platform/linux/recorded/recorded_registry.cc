@@ -24,7 +24,7 @@ class RecordedRegistry::State {
     const bool isChanged = folder && folder->update(parts);
     const std::uint64_t now = generationOf(parts);
     if (isChanged || !view_.recording || now != view_.generation) {
-      view_ = {std::make_shared<const Recording>(parts, log), now};
+      view_ = {std::make_shared<const Recording>(parts, live, log), now};
     }
     return view_;
   }
@@ -32,6 +32,7 @@ class RecordedRegistry::State {
   SystemLog& log;
   std::optional<RecordingFolder> folder;  // nothing when one recording is played
   std::vector<RecordingPart> parts;
+  LiveServices* live = nullptr;
 
  private:
   View view_;
@@ -69,8 +70,10 @@ bool hasProperties(const RecordedEntry& entry, const plist::Dictionary& wanted) 
 }  // namespace
 
 RecordedRegistry::RecordedRegistry(const DeviceRoot& root, FileSystem& files,
-                                   PropertyListCoding& propertyLists, SystemLog& log)
+                                   PropertyListCoding& propertyLists, SystemLog& log,
+                                   LiveServices* live)
     : state_(std::make_shared<State>(log)) {
+  state_->live = live;
   state_->folder.emplace(root, files, propertyLists, log);
 }
 RecordedRegistry::RecordedRegistry(const plist::Dictionary& recording, SystemLog& log)
@@ -113,6 +116,14 @@ KernelReturn RecordedRegistry::matchingServices(const plist::Dictionary& matchin
 plist::Dictionary RecordedRegistry::recording() {
   state_->current();
   return mergedRecording(state_->parts);
+}
+
+plist::Array RecordedRegistry::liveServices() {
+  plist::Array live = plist::Array::create();
+  for (const RecordedEntry& entry : state_->current().recording->services()) {
+    if (entry.isLive) live.append(entry.record);
+  }
+  return live;
 }
 
 }  // namespace tavrel

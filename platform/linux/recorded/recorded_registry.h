@@ -14,6 +14,7 @@
 #include "platform/driver_registry.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/recorded/live_services.h"
 #include "platform/property_list_coding.h"
 #include "platform/system_log.h"
 
@@ -22,8 +23,9 @@ namespace tavrel {
 class RecordedRegistry final : public DriverRegistry {
  public:
   /// Reads the folder on the first request for a service, and later reads changed files again.
+  /// Shows live services, where given, beside the recorded ones; they must outlive it.
   RecordedRegistry(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
-                   SystemLog& log);
+                   SystemLog& log, LiveServices* live = nullptr);
   /// Plays one recording, in the form that a file of the folder has. The dictionary is shared, so
   /// its changes show; those of its services and channels show once its "Generation" has changed
   /// too.
@@ -34,8 +36,11 @@ class RecordedRegistry final : public DriverRegistry {
   KernelReturn matchingServices(const plist::Dictionary& matching,
                                 std::unique_ptr<ServiceIterator>& services) override;
 
-  /// Everything that the registry shows now, as one recording that plays back the same.
+  /// Everything recorded that the registry shows now, as one recording that plays back the same.
   plist::Dictionary recording();
+
+  /// The live services that are shown, as a recording has them.
+  plist::Array liveServices();
 
  private:
   class State;

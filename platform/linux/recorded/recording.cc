@@ -1,5 +1,6 @@
 #include "platform/linux/recorded/recording.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "base/format.h"
@@ -98,7 +99,8 @@ plist::Dictionary mergedHub(std::span<const RecordingPart> parts, RefusalLog* re
 
 }  // namespace
 
-Recording::Recording(std::span<const RecordingPart> parts, SystemLog& log) {
+Recording::Recording(std::span<const RecordingPart> parts, LiveServices* live, SystemLog& log)
+    : live_(live) {
   RefusalLog refusals(log);
   for (const RecordingPart& part : parts) {
     for (const plist::Entry& entry : part.content) {
@@ -121,10 +123,32 @@ Recording::Recording(std::span<const RecordingPart> parts, SystemLog& log) {
     }
     hubChannels_.add(part.content.dictionary("Hub").array("Channels"), part.origin, refusals);
   }
-  if (const plist::Dictionary hub = mergedHub(parts, &refusals)) {
+  const bool isAnyLive = live && addLive(refusals);
+  plist::Dictionary hub = mergedHub(parts, &refusals);
+  if (!hub && isAnyLive) hub = plist::Dictionary{{"EntryID", kLiveHubID}};
+  if (hub) {
     add({hub, std::string(kReportHubClass), wordOf(hub.get("EntryID")), {}, true}, "the hub",
         refusals);
   }
+}
+
+bool Recording::addLive(RefusalLog& refusals) {
+  bool isAny = false;
+  const auto nameOf = [](const plist::Dictionary& record) {
+    return record.string("Name").value_or(*record.string("Class"));
+  };
+  for (const plist::Value& value : live_->services()) {
+    const plist::Dictionary record = value.dictionary();
+    const std::string className(*record.string("Class"));
+    const auto recorded = servicesOfClass(className);
+    const bool isReplaced = std::any_of(recorded.begin(), recorded.end(), [&](std::size_t at) {
+      return nameOf(services_[at].record) == nameOf(record);
+    });
+    if (isReplaced) continue;
+    add({record, className, wordOf(record.get("EntryID")), {}, false, true}, "live", refusals);
+    isAny = true;
+  }
+  return isAny;
 }
 
 void Recording::add(RecordedEntry entry, std::string_view origin, RefusalLog& refusals) {

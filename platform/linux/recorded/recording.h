@@ -17,6 +17,7 @@
 #include "base/keyed_hash.h"
 #include "base/plist.h"
 #include "platform/linux/recorded/hub_channels.h"
+#include "platform/linux/recorded/live_services.h"
 #include "platform/linux/system_log/refusal_log.h"
 
 namespace tavrel {
@@ -27,17 +28,23 @@ struct RecordingPart {
   plist::Dictionary content;
 };
 
+/// Entry id of the hub that is there for live services when no recording has one.
+inline constexpr std::int64_t kLiveHubID = 0x4c69'7665'4875'62;
+
 struct RecordedEntry {
   plist::Dictionary record;
   std::string className;
   std::optional<std::uint64_t> entryID;
   std::vector<plist::Dictionary> rows = {};  // of its "Methods"
   bool isHub = false;
+  bool isLive = false;
 };
 
 class Recording {
  public:
-  Recording(std::span<const RecordingPart> parts, SystemLog& log);
+  /// The live services, where there are any, come behind the recorded ones. A recorded service with
+  /// class and name of a live one takes its place. They must outlive the recording.
+  Recording(std::span<const RecordingPart> parts, LiveServices* live, SystemLog& log);
 
   const std::vector<RecordedEntry>& services() const { return services_; }
   /// Positions in `services`, in their order.
@@ -45,14 +52,18 @@ class Recording {
   /// The first service with that entry id; null when there is none.
   const RecordedEntry* serviceWithID(std::uint64_t entryID) const;
   const HubChannels& hubChannels() const { return hubChannels_; }
+  /// Null when there are none.
+  LiveServices* live() const { return live_; }
 
  private:
   void add(RecordedEntry entry, std::string_view origin, RefusalLog& refusals);
+  bool addLive(RefusalLog& refusals);
 
   std::vector<RecordedEntry> services_;
   std::unordered_map<std::uint64_t, std::size_t> byID_;
   std::unordered_map<std::string, std::vector<std::size_t>, KeyedHash> byClass_;
   HubChannels hubChannels_;
+  LiveServices* const live_;
 };
 
 /// All parts merged into one recording that plays back the same.

@@ -34,6 +34,11 @@ void fillWithNothing(MutableByteSpan rest) {
   }
 }
 
+// A channel that the hub knows; without a recorded one the next live one.
+struct Interest {
+  const HubChannel* recorded;
+};
+
 class ReportHubClient final : public UserClient {
  public:
   ReportHubClient(std::shared_ptr<const Recording> recording, plist::Dictionary hub, SystemLog& log)
@@ -95,20 +100,24 @@ class ReportHubClient final : public UserClient {
         interests.size() != kInterestHeaderBytes + std::uint64_t{*count} * kInterestBytes) {
       return kKernelBadArgument;
     }
-    std::vector<const HubChannel*> channels;
+    std::vector<Interest> channels;
+    auto live = recording_->live() ? recording_->live()->subscribe() : nullptr;
     std::uint64_t bytes = 0;
     for (std::size_t at = kInterestHeaderBytes; at < interests.size(); at += kInterestBytes) {
-      const HubChannel* const channel = recording_->hubChannels().find(
-          *loadLittle64(interests, at), *loadLittle64(interests, at + 8));
-      if (!channel) continue;
-      bytes += channel->largestGroup();
+      const std::uint64_t driver = *loadLittle64(interests, at);
+      const std::uint64_t id = *loadLittle64(interests, at + 8);
+      const HubChannel* const channel = recording_->hubChannels().find(driver, id);
+      const std::size_t size = channel ? channel->largestGroup() : live ? live->add(driver, id) : 0;
+      if (size == 0) continue;
+      bytes += size;
       if (bytes > limits::kDeviceAllocationBytes) return kKernelNoMemory;
-      channels.push_back(channel);
+      channels.push_back({channel});
     }
     auto buffer = SharedBuffer::create(std::max(static_cast<std::size_t>(bytes), kElementBytes));
     if (!buffer) return failFor(buffer.error());
     buffer_ = *std::move(buffer);
     channels_ = std::move(channels);
+    live_ = std::move(live);
     updates_ = 0;
     bufferID = ++bufferID_;
     return kKernelSuccess;
@@ -117,10 +126,18 @@ class ReportHubClient final : public UserClient {
   KernelReturn update(std::uint64_t bufferID) {
     if (!buffer_ || bufferID != bufferID_) return kKernelBadArgument;
     MutableByteSpan rest = buffer_->bytes();
-    for (const HubChannel* channel : channels_) {
-      const ByteSpan group = channel->group(updates_);
-      std::copy(group.begin(), group.end(), rest.begin());
-      rest = rest.subspan(group.size());
+    if (live_) live_->update();
+    std::size_t liveIndex = 0;
+    for (const Interest& interest : channels_) {
+      std::size_t written = 0;
+      if (interest.recorded) {
+        const ByteSpan group = interest.recorded->group(updates_);
+        std::copy(group.begin(), group.end(), rest.begin());
+        written = group.size();
+      } else {
+        written = live_->write(liveIndex++, rest);
+      }
+      rest = rest.subspan(written);
     }
     fillWithNothing(rest);
     ++updates_;
@@ -134,7 +151,8 @@ class ReportHubClient final : public UserClient {
   bool isClosed_ = false;
   std::optional<SharedBuffer> buffer_;
   std::uint32_t bufferID_ = 0;
-  std::vector<const HubChannel*> channels_;  // of the recording, in the order of interest
+  std::vector<Interest> channels_;  // in the order of interest
+  std::unique_ptr<LiveSampling> live_;
   std::size_t updates_ = 0;
 };
 

@@ -6,12 +6,15 @@
 //
 // platform/report_protocol.h has the protocol.
 //
+// Channels of live services are read anew for each update.
+//
 // The buffer holds one group of elements for each channel that the hub knows, in the order of
-// interest; channels that it does not know are left out. The first update shows the first group of
-// each channel's sequence, the next one the second, and so on for each buffer on its own. Groups of
-// one channel may differ in length, so the buffer has room for the longest. Groups that belong to
-// no channel (driver 0, id 2^63) cover the free space after the last group, so that a reader that
-// goes from group to group always reaches the end. Before the first update the buffer is zero.
+// interest; channels that it does not know, and live ones without a value, are left out. The first
+// update shows the first group of each channel's sequence, the next one the second, and so on for
+// each buffer on its own. Groups of one channel may differ in length, so the buffer has room for
+// the longest. Groups that belong to no channel (driver 0, id 2^63) cover the free space after the
+// last group, so that a reader that goes from group to group always reaches the end. Before the
+// first update the buffer is zero.
 #pragma once
 
 #include <memory>

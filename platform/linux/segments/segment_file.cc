@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cerrno>
+#include <string_view>
 #include <unistd.h>
 
 #include "base/utf8.h"
@@ -57,7 +58,6 @@ SegmentFacts SegmentFile::facts() const {
 
 SegmentFile::Key SegmentFile::readKey(std::uint32_t number) const {
   Key key;
-  if (number == 0 || number > kBHKeys) return key;
   const std::uint64_t entry =
       word64(kBHKeyTable + std::uint64_t{number - 1} * std::uint64_t{kBHKeyEntryBytes});
   const std::uint64_t offset = entry & 0xffffffff;
@@ -72,14 +72,15 @@ SegmentFile::Key SegmentFile::readKey(std::uint32_t number) const {
   return key;
 }
 
-std::optional<std::string_view> SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
-  auto known = keys_.find(number);
-  if (known == keys_.end()) {
-    if (number == 0 || number > kBHKeys) return std::nullopt;
-    known = keys_.emplace(number, readKey(number)).first;
+const std::string* SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
+  if (number == 0 || number > kBHKeys) return nullptr;
+  if (keys_.empty()) keys_.resize(kBHKeys + 1);
+  Key& key = keys_[number];
+  if (!key.isRead) {
+    key = readKey(number);
+    key.isRead = true;
   }
-  if (known->second.kind != kind) return std::nullopt;
-  return known->second.name;
+  return key.kind == kind ? &key.name : nullptr;
 }
 
 }  // namespace tavrel

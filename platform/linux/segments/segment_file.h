@@ -3,10 +3,8 @@
 
 #include <array>
 #include <cstdint>
-#include <map>
-#include <optional>
 #include <string>
-#include <string_view>
+#include <vector>
 
 #include "base/bytes.h"
 
@@ -33,11 +31,13 @@ class SegmentFile {
 
   SegmentFacts facts() const;
 
-  /// The name of the key with this number; nothing when there is no valid one of this kind.
-  std::optional<std::string_view> key(std::uint32_t number, std::uint8_t kind);
+  /// The name of the key with this number; null when there is no valid one of this kind. It stays
+  /// in place as long as this object lives.
+  const std::string* key(std::uint32_t number, std::uint8_t kind);
 
  private:
   struct Key {
+    bool isRead = false;
     std::uint8_t kind = 0;
     std::string name;
   };
@@ -45,7 +45,7 @@ class SegmentFile {
   Key readKey(std::uint32_t number) const;
 
   int descriptor_;
-  std::map<std::uint32_t, Key> keys_;
+  std::vector<Key> keys_;  // by number, once one was asked for
 };
 
 }  // namespace tavrel

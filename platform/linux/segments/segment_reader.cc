@@ -37,7 +37,7 @@ struct Instant {
   std::uint32_t secondsInDay;
 };
 
-std::optional<Instant> instantOf(std::int64_t seconds) {
+std::optional<Instant> dayAndSecond(std::int64_t seconds) {
   std::int64_t day = seconds / kSecondsPerDay;
   std::int64_t rest = seconds % kSecondsPerDay;
   if (rest < 0) {
@@ -47,6 +47,28 @@ std::optional<Instant> instantOf(std::int64_t seconds) {
   if (day != static_cast<std::int32_t>(day)) return std::nullopt;
   return Instant{static_cast<std::int32_t>(day), static_cast<std::uint32_t>(rest)};
 }
+
+// The same for many instants, most of which are of the same day: without divisions.
+class DayFinder {
+ public:
+  bool find(std::int64_t seconds) {
+    second_ = static_cast<std::uint64_t>(seconds) - static_cast<std::uint64_t>(midnight_);
+    if (second_ < static_cast<std::uint64_t>(kSecondsPerDay)) return true;
+    const auto instant = dayAndSecond(seconds);
+    if (!instant) return false;
+    day_ = instant->day;
+    second_ = instant->secondsInDay;
+    midnight_ = seconds - instant->secondsInDay;
+    return true;
+  }
+  std::int32_t day() const { return day_; }
+  std::uint32_t secondInDay() const { return static_cast<std::uint32_t>(second_); }
+
+ private:
+  std::int32_t day_ = 0;
+  std::uint64_t second_ = 0;
+  std::int64_t midnight_ = 0;
+};
 
 bool isUndated(std::uint64_t time) {
   return (time & kBHUndated) != 0;
@@ -191,9 +213,9 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   const bool isSet = now.sets != folded.sets;
   const std::int64_t value = isSet ? now.value : wrappingSubtract(now.value, folded.value);
   if (isSet || value != 0) {
-    const auto key = file_.key(before.key, kBHKindScalar);
-    const auto instant = instantOf(secondsOf(before.start, reading.boot));
-    if (key && instant && (isUndated(before.start) || instant->secondsInDay == 0)) {
+    const std::string* const key = file_.key(before.key, kBHKindScalar);
+    const auto instant = dayAndSecond(secondsOf(before.start, reading.boot));
+    if (key != nullptr && instant && (isUndated(before.start) || instant->secondsInDay == 0)) {
       const std::int64_t time = isSet ? nanosecondsOf(now.setTime, reading.boot) : 0;
       reading.sink.takeScalar({*key, instant->day, isSet, value, time});
     } else {
@@ -232,30 +254,35 @@ void SegmentReader::readChunk(Reading& reading, std::uint32_t index) {
       if (isDateMissing) break;
     }
     if (isDateMissing) reading.progress.isComplete = false;
-    if (ready > end) file_.read(offset + first, rest);
-    if (file_.word32(offset + kBHChunkGeneration) != generation) {
-      reading.progress.isComplete = false;
-      return;
+    // Without a writer what was read is whole.
+    if (!reading.writerIsGone) {
+      if (ready > end) file_.read(offset + first, rest);
+      if (file_.word32(offset + kBHChunkGeneration) != generation) {
+        reading.progress.isComplete = false;
+        return;
+      }
     }
+    DayFinder days;
     for (; end < ready; ++end) {
       const std::uint64_t mark = markAt(end);
       // Only a hostile writer withdraws a mark, or its date.
       if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
       const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
-      const auto key = file_.key(mark & 0xffff, kBHKindDistribution);
-      const auto instant = instantOf(secondsOf(time, reading.boot));
-      if (!key || !instant) {
+      const auto number = static_cast<std::uint32_t>(mark & 0xffff);
+      const std::string* const key = file_.key(number, kBHKindDistribution);
+      if (key == nullptr || !days.find(secondsOf(time, reading.boot))) {
         ++reading.progress.refused;
         continue;
       }
       const std::uint64_t bits =
           *loadLittle64(bytes, kBHChunkFirst + std::uint64_t{end} * kBHRecordBytes);
       reading.sink.takeRecord(
-          {*key, instant->day, instant->secondsInDay, std::bit_cast<double>(bits)});
+          {*key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
     }
   }
   folded = {generation, end};
-  if (end == kBHChunkRecords && file_.word32(offset + kBHChunkAcknowledged) != generation) {
+  if (end == kBHChunkRecords && !reading.writerIsGone &&
+      file_.word32(offset + kBHChunkAcknowledged) != generation) {
     reading.progress.acknowledgements.push_back({offset + kBHChunkAcknowledged, generation});
   }
 }

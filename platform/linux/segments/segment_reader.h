@@ -36,7 +36,8 @@ struct SegmentScalar {
 
 /// A measurement.
 struct SegmentRecord {
-  std::string_view key;  // valid during the call
+  std::string_view key;     // valid as long as the reader
+  std::uint32_t keyNumber;  // of the key in this segment, from 1 to kBHKeys
   std::int32_t day;
   std::uint32_t secondsInDay;
   double value;  // any bits, also not-a-number

@@ -1,23 +1,26 @@
 #include "platform/linux/store/sqlite_batch.h"
 
 #include <algorithm>
+#include <limits>
 #include <utility>
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
+#include "platform/linux/store/chunk_reader.h"
 #include "platform/linux/store/sqlite_schema.h"
 
 namespace tavrel {
 namespace {
 
 // Rows of either kind held back before they are written, in bytes. They are written in the order of
-// their keys: the more there are, the fewer pages and chunks are written twice.
+// their keys: the more there are, the fewer pages are written twice.
 constexpr std::size_t kPendingBytes = 8U << 20;
+
+// A longer log is moved into the database after a commit.
+constexpr off_t kLogBytes = 1 << 20;
 
 // The memory of a waiting distribution, without its records.
 constexpr std::size_t kPendingSeriesBytes = 256;
-
-constexpr std::int64_t kValuesPerSeries = std::int64_t{kValuesPerChunk} << kChunkOrdinalBits;
 
 void checkKey(std::string_view key) {
   if (key.size() <= limits::kStoreKeyBytes) return;
@@ -39,20 +42,17 @@ struct SqliteBatch::Statements {
       : setScalar(connection,
                   "INSERT OR REPLACE INTO scalars (day, key, value) VALUES (?1, ?2, ?3)"),
         getScalar(connection, "SELECT value FROM scalars WHERE day = ?1 AND key = ?2"),
-        getSeries(connection,
-                  "SELECT series, count FROM distributions WHERE day = ?1 AND key = ?2"),
-        setSeries(connection,
-                  "INSERT OR REPLACE INTO distributions (day, key, series, count) "
-                  "VALUES (?1, ?2, ?3, ?4)"),
-        getChunk(connection, "SELECT data FROM chunks WHERE chunk = ?1"),
-        setChunk(connection, "INSERT OR REPLACE INTO chunks (chunk, data) VALUES (?1, ?2)") {}
+        getRuns(connection, "SELECT count, runs FROM distributions WHERE day = ?1 AND key = ?2"),
+        setRuns(connection,
+                "INSERT OR REPLACE INTO distributions (day, key, count, runs) "
+                "VALUES (?1, ?2, ?3, ?4)"),
+        addChunk(connection, "INSERT INTO chunks (chunk, data) VALUES (?1, ?2)") {}
 
   SqliteStatement setScalar;
   SqliteStatement getScalar;
-  SqliteStatement getSeries;
-  SqliteStatement setSeries;
-  SqliteStatement getChunk;
-  SqliteStatement setChunk;
+  SqliteStatement getRuns;
+  SqliteStatement setRuns;
+  SqliteStatement addChunk;
 };
 
 std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
@@ -65,13 +65,17 @@ SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site)
     : connection_(std::move(connection)), site_(site), kept_(site.path) {
   // A large import changes many pages.
   connection_.execute("PRAGMA cache_size = -8192");
-  statements_ = std::make_unique<Statements>(connection_);
 }
 
 void SqliteBatch::begin() {
   if (begun_) return;
   connection_.execute("BEGIN IMMEDIATE");
+  if (schemaVersion(connection_) == kFirstSchemaVersion) {
+    migrate(connection_);
+    connection_.execute("BEGIN IMMEDIATE");
+  }
   begun_ = true;
+  statements_ = std::make_unique<Statements>(connection_);
   if (kept_.exist()) takeKeptValues();
 }
 
@@ -149,16 +153,30 @@ Status SqliteBatch::setScalar(std::int32_t day, std::string_view key, std::int64
   return Done{};
 }
 
+std::optional<std::int64_t> SqliteBatch::readScalar(std::int32_t day, std::string_view key) {
+  checkKey(key);
+  writeScalars();
+  begin();
+  SqliteStatement& statement = statements_->getScalar;
+  statement.bind(1, day);
+  statement.bind(2, key);
+  std::optional<std::int64_t> value;
+  if (statement.step()) value = statement.integer(0);
+  statement.reset();
+  return value;
+}
+
+Expected<std::optional<std::int64_t>> SqliteBatch::scalar(std::int32_t day, std::string_view key) {
+  try {
+    return readScalar(day, key);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
 Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64_t amount) {
   try {
-    checkKey(key);
-    writeScalars();
-    begin();
-    SqliteStatement& statement = statements_->getScalar;
-    statement.bind(1, day);
-    statement.bind(2, key);
-    const std::int64_t value = statement.step() ? statement.integer(0) : 0;
-    statement.reset();
+    const std::int64_t value = readScalar(day, key).value_or(0);
     std::int64_t sum = 0;
     if (__builtin_add_overflow(value, amount, &sum)) {
       return Error{"adding " + std::to_string(amount) + " to " + std::to_string(value) +
@@ -173,11 +191,63 @@ Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64
 
 Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
                                 std::uint32_t secondsInDayOffset, double value) {
+  const DistributionSample sample{value, secondsInDayOffset};
+  return appendValues(day, key, {&sample, 1});
+}
+
+Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
+                                 std::span<const DistributionSample> samples) {
+  // As many as wait at most, so that a large span is no exception.
+  constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
   try {
-    PendingSeries& series = pendingSeries({day, key});
-    appendDistributionRecord(series.records, {value, secondsInDayOffset});
-    pendingBytes_ += kDistributionRecordBytes;
-    if (pendingBytes_ >= kPendingBytes) writeDistributions();
+    while (!samples.empty()) {
+      const auto taken = samples.first(std::min(samples.size(), kPendingBytes / kSampleBytes));
+      PendingSeries& series = pendingSeries({day, key});
+      appendPacked(series.values, series.offsets, taken);
+      pendingBytes_ += taken.size() * kSampleBytes;
+      if (pendingBytes_ >= kPendingBytes) writeDistributions();
+      samples = samples.subspan(taken.size());
+    }
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Expected<std::optional<std::string>> SqliteBatch::segmentPosition(std::uint32_t owner,
+                                                                  SegmentIdentity identity) {
+  try {
+    begin();
+    return segment_table::position(connection_, owner, identity);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
+  try {
+    begin();
+    return segment_table::names(connection_);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+}
+
+Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity identity,
+                                       std::string_view position) {
+  try {
+    begin();
+    segment_table::setPosition(connection_, owner, identity, position);
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity identity) {
+  try {
+    begin();
+    segment_table::removePosition(connection_, owner, identity);
   } catch (const StoreFailure& failure) {
     return describe(failure);
   }
@@ -211,72 +281,87 @@ void SqliteBatch::writeDistributions() {
     return a->first.day != b->first.day ? a->first.day < b->first.day : a->first.key < b->first.key;
   });
   for (const auto* entry : series)
-    writeSeries(entry->first, entry->second->records);
+    writeSeries(entry->first, {entry->second->values, entry->second->offsets});
   last_ = nullptr;
   pending_.clear();
   pendingBytes_ = 0;
 }
 
-std::int64_t SqliteBatch::newSeries() {
-  // Every series has a chunk, so that the last chunk belongs to the latest series.
-  if (nextSeries_ < 0) {
-    nextSeries_ =
-        (connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") >> kChunkOrdinalBits) + 1;
-  }
-  if (nextSeries_ < 0 || nextSeries_ >= std::int64_t{1} << (62 - kChunkOrdinalBits)) {
-    throw StoreFailure{StoreFault::Other,
-                       "no number is left for a new distribution: move the file away"};
-  }
-  return nextSeries_++;
-}
-
-void SqliteBatch::writeSeries(const SeriesName& name, std::string_view records) {
+void SqliteBatch::writeSeries(const SeriesName& name, const DistributionBlock& added) {
   Statements& sql = *statements_;
-  sql.getSeries.bind(1, name.day);
-  sql.getSeries.bind(2, name.key);
-  std::int64_t series = -1;
+  sql.getRuns.bind(1, name.day);
+  sql.getRuns.bind(2, name.key);
+  std::vector<ChunkRun> runs;
   std::int64_t count = 0;
-  if (sql.getSeries.step()) {
-    series = sql.getSeries.integer(0);
-    count = sql.getSeries.integer(1);
-    if (series < 0 || count <= 0 || count > kValuesPerSeries) throwInconsistent();
+  if (sql.getRuns.step()) {
+    count = sql.getRuns.integer(0);
+    auto unpacked = unpackRuns(sql.getRuns.bytes(1));
+    if (!unpacked || count <= 0 || valuesIn(*unpacked) != count) throwInconsistent();
+    runs = std::move(*unpacked);
   }
-  sql.getSeries.reset();
-  if (series < 0) series = newSeries();
+  sql.getRuns.reset();
 
-  const auto added = static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
-  if (added > kValuesPerSeries - count) {
+  const auto addedCount = static_cast<std::int64_t>(added.values.size() / kPackedValueBytes);
+  if (addedCount > kValuesPerDistribution - count) {
     throw StoreFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
                                               " values of one day and takes no more: use another "
                                               "key"};
   }
-
-  constexpr std::size_t kFullChunk = kValuesPerChunk * kDistributionRecordBytes;
-  std::int64_t chunk =
-      (series << kChunkOrdinalBits) + count / static_cast<std::int64_t>(kValuesPerChunk);
-  std::string filled;
-  if (const std::size_t begun = static_cast<std::size_t>(count) % kValuesPerChunk; begun != 0) {
-    sql.getChunk.bind(1, chunk);
-    if (sql.getChunk.step()) filled = sql.getChunk.bytes(0);
-    sql.getChunk.reset();
-    if (filled.size() != begun * kDistributionRecordBytes) throwInconsistent();
-  }
-  for (std::string_view rest = records; !rest.empty(); ++chunk) {
-    const std::size_t taken = std::min(rest.size(), kFullChunk - filled.size());
-    std::string_view data = rest.substr(0, taken);
-    if (!filled.empty()) data = filled.append(data);
-    sql.setChunk.bind(1, chunk);
-    sql.setChunk.bind(2, data);
-    sql.setChunk.run();
-    filled.clear();
-    rest.remove_prefix(taken);
+  runs.push_back({0, 0, addedCount});
+  const std::size_t first = std::min(firstToJoin(runs), runs.size() - 1);
+  // Values that are damaged stay where they are, and each reader tells of them.
+  if (auto earlier = takeOut(std::span(runs).subspan(first, runs.size() - 1 - first))) {
+    runs[first] = writeRun({earlier->values += added.values, earlier->offsets += added.offsets});
+    runs.resize(first + 1);
+  } else {
+    runs.back() = writeRun(added);
   }
 
-  sql.setSeries.bind(1, name.day);
-  sql.setSeries.bind(2, name.key);
-  sql.setSeries.bind(3, series);
-  sql.setSeries.bind(4, count + added);
-  sql.setSeries.run();
+  std::string packed;
+  for (const ChunkRun& run : runs)
+    appendRun(packed, run);
+  sql.setRuns.bind(1, name.day);
+  sql.setRuns.bind(2, name.key);
+  sql.setRuns.bind(3, count + addedCount);
+  sql.setRuns.bind(4, std::string_view(packed));
+  sql.setRuns.run();
+}
+
+// Takes the chunks of the runs out of the store. Nothing, and nothing is changed, when they are not
+// what the runs say.
+std::optional<SqliteBatch::PendingSeries> SqliteBatch::takeOut(std::span<const ChunkRun> runs) {
+  if (runs.empty()) return std::nullopt;
+  PendingSeries found;
+  try {
+    ChunkReader reader(connection_);
+    reader.begin({runs.begin(), runs.end()}, *valuesIn(runs));
+    while (const auto block = reader.next(true)) {
+      found.values += block->values;
+      found.offsets += block->offsets;
+    }
+  } catch (const StoreFailure& failure) {
+    if (failure.fault != StoreFault::Other) throw;
+    return std::nullopt;
+  }
+  SqliteStatement remove(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
+  for (const ChunkRun& run : runs) {
+    remove.bind(1, run.first);
+    remove.bind(2, run.end());
+    remove.run();
+  }
+  return found;
+}
+
+// In new chunks behind all others.
+ChunkRun SqliteBatch::writeRun(const DistributionBlock& block) {
+  if (nextChunk_ < 0) {
+    nextChunk_ = connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") + 1;
+  }
+  const auto count = static_cast<std::int64_t>(block.values.size() / kPackedValueBytes);
+  const ChunkRun run{nextChunk_, (count + kValuesPerChunk - 1) / kValuesPerChunk, count};
+  addChunks(block.values, kValuesPerChunk * kPackedValueBytes);
+  addChunks(block.offsets, kValuesPerChunk * kPackedOffsetBytes);
+  return run;
 }
 
 void SqliteBatch::finish() {
@@ -286,6 +371,36 @@ void SqliteBatch::finish() {
   if (!begun_) return;
   connection_.execute("COMMIT");
   if (takenNumber_) removeTakenValues();
+  limitLog();
+}
+
+void SqliteBatch::addChunks(std::string_view data, std::size_t bytesPerChunk) {
+  SqliteStatement& statement = statements_->addChunk;
+  for (; !data.empty(); data.remove_prefix(std::min(bytesPerChunk, data.size()))) {
+    if (nextChunk_ < 0 || nextChunk_ == std::numeric_limits<std::int64_t>::max()) {
+      throw StoreFailure{StoreFault::Other,
+                         "no number is left for more values: move the file away"};
+    }
+    statement.bind(1, nextChunk_++);
+    statement.bind(2, data.substr(0, bytesPerChunk));
+    statement.run();
+  }
+}
+
+SqliteConnection SqliteBatch::release() {
+  statements_.reset();
+  return std::move(connection_);
+}
+
+// The changes are kept already, so that the log may stay as it is for now.
+void SqliteBatch::limitLog() {
+  const auto log = FileSystem::status(site_.path + "-wal");
+  if (!log || log->st_size <= kLogBytes) return;
+  try {
+    connection_.checkpoint(false);
+  } catch (const StoreFailure& failure) {
+    site_.tell(failure, "; the write-ahead log stays as it is");
+  }
 }
 
 Status SqliteBatch::commit() {

@@ -15,14 +15,18 @@
 #include <cstdint>
 #include <memory>
 #include <optional>
+#include <span>
 #include <string>
 #include <string_view>
 #include <unordered_map>
 #include <vector>
 
 #include "base/expected.h"
+#include "platform/distribution_values.h"
+#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_connection.h"
+#include "platform/linux/store/sqlite_segments.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/statistics_store.h"
 
@@ -41,8 +45,22 @@ class SqliteBatch {
   /// Adds to the day's value, which is 0 when absent. A sum outside of 64 bits is refused and
   /// leaves the value as it was.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t amount);
+  /// The day's value as this batch leaves it; nothing when there is none.
+  Expected<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key);
   Status appendValue(std::int32_t day, std::string_view key, std::uint32_t secondsInDayOffset,
                      double value);
+  Status appendValues(std::int32_t day, std::string_view key,
+                      std::span<const DistributionSample> samples);
+
+  /// How far a segment was folded, as an earlier batch stored it; nothing when unknown. From this
+  /// call on other writers wait, so that nobody else folds the segment until the commit.
+  Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
+                                                       std::span<const std::byte, 16> identity);
+  /// The segments whose positions the store holds, by owner and then by identity.
+  Expected<std::vector<SegmentName>> segmentNames();
+  Status setSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity,
+                            std::string_view position);
+  Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);
 
   /// Keeps the changes and ends the batch.
   Status commit();
@@ -50,6 +68,8 @@ class SqliteBatch {
   /// As `setScalar` and `commit`, for use inside the store: they throw `StoreFailure`.
   void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void finish();
+  /// The connection, when the batch has been finished.
+  SqliteConnection release();
 
  private:
   struct Statements;
@@ -63,10 +83,11 @@ class SqliteBatch {
   struct HashName {
     std::size_t operator()(const SeriesName& name) const;
   };
-  // Values that wait to be written, as chunk records. Names in the map borrow `key`.
+  // Values that wait to be written, packed. Names in the map borrow `key`.
   struct PendingSeries {
     std::string key;
-    std::string records;
+    std::string values;
+    std::string offsets;
   };
   // A scalar that waits to be written; its key is in `scalarKeys_`.
   struct PendingScalar {
@@ -80,12 +101,16 @@ class SqliteBatch {
   void begin();
   void takeKeptValues();
   void removeTakenValues();
+  void limitLog();
   PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
+  std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
-  void writeSeries(const SeriesName& name, std::string_view records);
-  std::int64_t newSeries();
+  void writeSeries(const SeriesName& name, const DistributionBlock& added);
+  std::optional<PendingSeries> takeOut(std::span<const ChunkRun> runs);
+  ChunkRun writeRun(const DistributionBlock& block);
+  void addChunks(std::string_view data, std::size_t bytesPerChunk);
   Error describe(const StoreFailure& failure) const;
 
   SqliteConnection connection_;
@@ -100,7 +125,7 @@ class SqliteBatch {
   std::size_t pendingBytes_ = 0;  // of `pending_`
   // Values of one distribution often follow each other.
   const PendingMap::value_type* last_ = nullptr;
-  std::int64_t nextSeries_ = -1;  // not looked up yet when negative
+  std::int64_t nextChunk_ = -1;  // not looked up yet when negative
 };
 
 }  // namespace tavrel

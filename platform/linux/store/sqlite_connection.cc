@@ -145,8 +145,9 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::Read:
-      // A user who may write uses the log like a writer, and so leaves no log behind. SQLite opens
-      // a write-protected file for reading.
+    case Access::Alone:
+      // A user who may write can use a log that has no index. SQLite opens a write-protected file
+      // for reading.
       flags |= SQLITE_OPEN_READWRITE;
       break;
     case Access::Immutable:
@@ -164,7 +165,10 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
     sqlite().db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
-    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512");
+    if (access == Access::Alone) execute("PRAGMA locking_mode = EXCLUSIVE");
+    // Closing leaves the log: moving it each time would write every page twice for one commit.
+    sqlite().db_config(handle_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
+    execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512; PRAGMA secure_delete = FAST");
   } catch (...) {
     sqlite().close_v2(handle_);
     throw;
@@ -197,9 +201,11 @@ std::int64_t SqliteConnection::integer(std::string_view sql) {
   return statement.step() ? statement.integer(0) : 0;
 }
 
-bool SqliteConnection::checkpoint() {
+bool SqliteConnection::checkpoint(bool waits) {
+  if (!waits) sqlite().busy_handler(handle_, nullptr, nullptr);
   const int code =
       sqlite().wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);
+  if (!waits) sqlite().busy_handler(handle_, waitForLock, busy_.get());
   if (code == SQLITE_OK) return true;
   if ((code & 0xFF) == SQLITE_BUSY || (code & 0xFF) == SQLITE_LOCKED) return false;
   throwFailure(handle_, code);

@@ -63,6 +63,7 @@ class SqliteConnection {
   enum class Access : std::uint8_t {
     Create,     // read and write; an absent file is created
     Read,       // read; uses the write-ahead log as far as the user may
+    Alone,      // read; keeps all others out, and needs no file for the log's index
     Immutable,  // read a file that no process writes, without locks or a log
   };
 
@@ -78,8 +79,9 @@ class SqliteConnection {
   std::int64_t integer(std::string_view sql);
 
   /// Moves the write-ahead log into the database and empties it. False when other processes
-  /// prevented part of that; as much as possible has then been moved.
-  bool checkpoint();
+  /// prevented part of that, for as long as is waited for them; as much as possible has then been
+  /// moved.
+  bool checkpoint(bool waits = true);
 
   sqlite3* handle() const { return handle_; }
 

@@ -6,6 +6,7 @@
 #include <utility>
 
 #include "base/text.h"
+#include "platform/linux/store/chunk_reader.h"
 
 namespace tavrel {
 namespace {
@@ -31,11 +32,10 @@ StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreF
 
 class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  public:
-  ChunkEnumerator(SqliteStatement& chunks, std::int64_t series, std::int64_t count)
-      : chunks_(chunks), series_(series), count_(count) {}
-  ~ChunkEnumerator() override {
-    if (state_ == State::Reading) chunks_.reset();
-  }
+  // `row` is at one of store_sql::distributions, and must stay there.
+  ChunkEnumerator(const SqliteStatement& row, std::int64_t version, ChunkReader& reader)
+      : row_(row), version_(version), reader_(reader) {}
+  ~ChunkEnumerator() override { reader_.end(); }
   ChunkEnumerator(const ChunkEnumerator&) = delete;
   ChunkEnumerator& operator=(const ChunkEnumerator&) = delete;
 
@@ -44,55 +44,44 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  private:
   enum class State : std::uint8_t { Unread, Reading, Ended };
 
-  std::string_view nextBlock() override {
+  DistributionBlock nextBlock(bool wantsOffsets) override {
+    if (state_ == State::Ended) return {};
     try {
       if (state_ == State::Unread) begin();
-      if (state_ == State::Reading && chunks_.step()) {
-        const std::string_view records = chunks_.bytes(0);
-        if (records.empty() || records.size() % kDistributionRecordBytes != 0 ||
-            records.size() > kValuesPerChunk * kDistributionRecordBytes) {
-          refuse("its values are not in the form that this program writes");
-        }
-        read_ += static_cast<std::int64_t>(records.size() / kDistributionRecordBytes);
-        if (read_ <= count_) return records;
-      }
-      if (state_ == State::Reading && read_ != count_) {
-        refuse("it does not hold the " + std::to_string(count_) + " values that it counts");
-      }
+      if (const auto block = reader_.next(wantsOffsets)) return *block;
     } catch (const StoreFailure& failure) {
       failure_ = failure;
       fail();
     }
-    if (state_ == State::Reading) chunks_.reset();
     state_ = State::Ended;
     return {};
   }
 
-  [[noreturn]] static void refuse(const std::string& reason) {
-    throw StoreFailure{StoreFault::Other,
-                       reason + ": restore the file from a copy or move it away"};
-  }
-
   void begin() {
-    constexpr std::int64_t kSeriesEnd = std::int64_t{1} << (62 - kChunkOrdinalBits);
-    if (series_ < 0 || series_ >= kSeriesEnd) {
-      state_ = State::Ended;
-      refuse("it refers to values that cannot exist");
+    const std::int64_t count = row_.integer(2);
+    std::optional<std::vector<ChunkRun>> runs;
+    if (version_ == kFirstSchemaVersion) {
+      if (const auto run = runOfSeries(row_.integer(3), count)) runs = {*run};
+    } else {
+      runs = unpackRuns(row_.bytes(3));
     }
-    chunks_.bind(1, series_ << kChunkOrdinalBits);
-    chunks_.bind(2, (series_ + 1) << kChunkOrdinalBits);
+    if (!runs) {
+      throw StoreFailure{StoreFault::Other,
+                         "it refers to values that cannot exist: restore the file from a copy or "
+                         "move it away"};
+    }
+    reader_.begin(std::move(*runs), count);
     state_ = State::Reading;
   }
 
-  SqliteStatement& chunks_;
-  std::int64_t series_;
-  std::int64_t count_;
-  std::int64_t read_ = 0;
+  const SqliteStatement& row_;
+  std::int64_t version_;
+  ChunkReader& reader_;
   State state_ = State::Unread;
   std::optional<StoreFailure> failure_;
 };
 
-// Runs `next`, one of store_sql::kNext..., through the days that hold `key`, and calls `handle` for
+// Runs `next`, of store_sql::kNext, through the days that hold `key`, and calls `handle` for
 // each of its rows.
 template <class Handle>
 void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDay,
@@ -133,14 +122,13 @@ struct SqliteHistory::Selection {
 
   bool isEmpty() const { return firstDay > lastDay; }
 
-  /// The query that gives the selection in its order.
-  std::string_view choose(std::string_view ofDay, std::string_view byKey,
-                          std::string_view byDay) const {
-    if (firstDay == lastDay) return ofDay;
-    return order == Order::KeyThenDay ? byKey : byDay;
+  /// The rows of the selection, in its order.
+  std::string_view rows() const {
+    if (firstDay == lastDay) return store_sql::kOfDay;
+    return order == Order::KeyThenDay ? store_sql::kByKey : store_sql::kByDay;
   }
 
-  /// Binds the parameters of that query. The selection must outlive the statement's run.
+  /// Binds the parameters of `rows()`. The selection must outlive the statement's run.
   void bind(SqliteStatement& statement) const {
     statement.bind(1, firstDay);
     if (firstDay == lastDay) return statement.bind(2, prefix);
@@ -198,7 +186,16 @@ template <class Read>
 void SqliteHistory::readUnchanged(Read read) {
   if (!store_) return;
   try {
-    read();
+    version_ = schemaVersion(store_->connection);
+    try {
+      read();
+    } catch (const StoreFailure& failure) {
+      // A writer may have converted the store since. The query has then not given any row yet.
+      if (failure.fault != StoreFault::Foreign) throw;
+      const auto before = std::exchange(version_, schemaVersion(store_->connection));
+      if (version_ == before) throw;
+      read();
+    }
   } catch (const StoreFailure&) {
     checkUnchanged();
     throw;
@@ -249,7 +246,7 @@ Status SqliteHistory::walkDistributions(std::string_view prefix, std::int32_t fi
 Status SqliteHistory::walkScalar(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
                                  const ScalarRowHandler& rowHandler) {
   return attempt([&] {
-    SqliteStatement next(store_->connection, store_sql::kNextScalar);
+    SqliteStatement next(store_->connection, store_sql::scalars(store_sql::kNext));
     eachDayOf(next, key, firstDay, lastDay, [&](bool& stop) {
       rowHandler(key, static_cast<std::int32_t>(next.integer(1)), next.integer(2), stop);
     });
@@ -259,10 +256,10 @@ Status SqliteHistory::walkScalar(std::string_view key, std::int32_t firstDay, st
 Status SqliteHistory::walkDistribution(std::string_view key, std::int32_t firstDay,
                                        std::int32_t lastDay, const CountedRowHandler& rowHandler) {
   return attemptTellingAtEnd([&](const FailureHandler& tell) {
-    SqliteStatement next(store_->connection, store_sql::kNextDistribution);
-    SqliteStatement chunks(store_->connection, store_sql::kChunks);
+    SqliteStatement next(store_->connection, store_sql::distributions(store_sql::kNext, version_));
+    ChunkReader reader(store_->connection);
     eachDayOf(next, key, firstDay, lastDay,
-              [&](bool& stop) { readRow(next, chunks, rowHandler, tell, stop); });
+              [&](bool& stop) { readRow(next, reader, rowHandler, tell, stop); });
   });
 }
 
@@ -286,15 +283,24 @@ Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
   return span;
 }
 
+Expected<std::optional<std::string>> SqliteHistory::segmentPosition(std::uint32_t owner,
+                                                                    SegmentIdentity identity) {
+  std::optional<std::string> position;
+  const Status read = attempt([&] {
+    if (version_ == kFirstSchemaVersion) return;
+    position = segment_table::position(store_->connection, owner, identity);
+  });
+  if (!read) return read.error();
+  return position;
+}
+
 Status SqliteHistory::beginSnapshot() {
   return attempt([&] { store_->connection.execute("BEGIN"); });
 }
 
 void SqliteHistory::readScalars(const Selection& selection, const ScalarRowHandler& rowHandler) {
   if (selection.isEmpty()) return;
-  SqliteStatement rows(store_->connection,
-                       selection.choose(store_sql::kScalarsOfDay, store_sql::kScalarsByKey,
-                                        store_sql::kScalarsByDay));
+  SqliteStatement rows(store_->connection, store_sql::scalars(selection.rows()));
   selection.bind(rows);
   bool stop = false;
   while (!stop && rows.step()) {
@@ -310,26 +316,23 @@ void SqliteHistory::readDistributions(const Selection& selection,
                                       const CountedRowHandler& rowHandler,
                                       const FailureHandler& tell) {
   if (selection.isEmpty()) return;
-  SqliteStatement rows(store_->connection, selection.choose(store_sql::kDistributionsOfDay,
-                                                            store_sql::kDistributionsByKey,
-                                                            store_sql::kDistributionsByDay));
-  SqliteStatement chunks(store_->connection, store_sql::kChunks);
+  SqliteStatement rows(store_->connection, store_sql::distributions(selection.rows(), version_));
+  ChunkReader reader(store_->connection);
   selection.bind(rows);
   bool stop = false;
   while (!stop && rows.step()) {
     if (!rows.bytes(0).starts_with(selection.prefix)) break;
-    readRow(rows, chunks, rowHandler, tell, stop);
+    readRow(rows, reader, rowHandler, tell, stop);
   }
 }
 
-void SqliteHistory::readRow(SqliteStatement& row, SqliteStatement& chunks,
+void SqliteHistory::readRow(SqliteStatement& row, ChunkReader& reader,
                             const CountedRowHandler& rowHandler, const FailureHandler& tell,
-                            bool& stop) {
+                            bool& stop) const {
   const std::string_view key = row.bytes(0);
   const auto day = static_cast<std::int32_t>(row.integer(1));
-  const std::int64_t count = row.integer(3);
-  ChunkEnumerator values(chunks, row.integer(2), count);
-  rowHandler(key, day, count, values, stop);
+  ChunkEnumerator values(row, version_, reader);
+  rowHandler(key, day, row.integer(2), values, stop);
   if (!values.failure()) return;
   if (values.failure()->fault == StoreFault::Damaged) throw *values.failure();
   tell(inDistribution(key, day, *values.failure()));

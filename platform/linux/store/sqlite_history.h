@@ -14,10 +14,13 @@
 
 #include "base/expected.h"
 #include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_segments.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/statistics_store.h"
 
 namespace tavrel {
+
+class ChunkReader;
 
 class SqliteHistory : public BHHistory {
  public:
@@ -62,6 +65,11 @@ class SqliteHistory : public BHHistory {
   /// The first and the last day in the store; nothing when the store is empty.
   Expected<std::optional<DaySpan>> daysHeld();
 
+  /// How far a segment was folded; nothing when unknown. Agrees with the values that were read
+  /// since `beginSnapshot`.
+  Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
+                                                       std::span<const std::byte, 16> identity);
+
   /// From here on all queries see the store as it is at the first of them.
   Status beginSnapshot();
 
@@ -73,8 +81,8 @@ class SqliteHistory : public BHHistory {
   using FailureHandler = std::function<void(const StoreFailure& failure)>;
   void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
                          const FailureHandler& tell);
-  static void readRow(SqliteStatement& row, SqliteStatement& chunks,
-                      const CountedRowHandler& rowHandler, const FailureHandler& tell, bool& stop);
+  void readRow(SqliteStatement& row, ChunkReader& reader, const CountedRowHandler& rowHandler,
+               const FailureHandler& tell, bool& stop) const;
   template <class Read>
   void readUnchanged(Read read);
   void checkUnchanged() const;
@@ -87,6 +95,7 @@ class SqliteHistory : public BHHistory {
   StoreSite site_;
   std::optional<FileIdentity> identity_;
   std::optional<ReadableStore> store_;
+  std::int64_t version_ = kSchemaVersion;  // as it was when the query began
 };
 
 }  // namespace tavrel

@@ -5,46 +5,50 @@
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
+#include <unistd.h>
 
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/sqlite_site.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::int64_t kSchemaVersion = 1;
-
-// For a new store. Reading values is as fast as the system delivers pages: twice as fast in 64 KiB
-// as in SQLite's 4 KiB. Commits, which write whole pages, are few.
-constexpr const char* kPageSize = "PRAGMA page_size = 65536";
-
-// The log is moved into the database when it is longer than 4 MiB, as with pages of 4 KiB.
-constexpr const char* kAutomaticCheckpoint = "PRAGMA wal_autocheckpoint = 64";
+// For a new store, whatever the library was built with. A commit writes whole pages.
+constexpr const char* kPageSize = "PRAGMA page_size = 4096";
 
 // Keys are blobs: they are compared byte by byte and may hold any byte.
-constexpr const char* kSchema = R"(
+constexpr const char* kScalarsTable = R"(
 CREATE TABLE scalars (
   day INTEGER NOT NULL,
   key BLOB NOT NULL,
   value INTEGER NOT NULL,
   PRIMARY KEY (day, key)
-) STRICT, WITHOUT ROWID;
+) STRICT, WITHOUT ROWID)";
+constexpr const char* kDistributionsTable = R"(
 CREATE TABLE distributions (
   day INTEGER NOT NULL,
   key BLOB NOT NULL,
-  series INTEGER NOT NULL,
   count INTEGER NOT NULL,
+  runs BLOB NOT NULL,
   PRIMARY KEY (day, key)
-) STRICT, WITHOUT ROWID;
+) STRICT, WITHOUT ROWID)";
+constexpr const char* kChunksTable = R"(
 CREATE TABLE chunks (
   chunk INTEGER PRIMARY KEY,
   data BLOB NOT NULL
-) STRICT;
-PRAGMA user_version = 1;
-)";
+) STRICT)";
+constexpr const char* kSegmentsTable = R"(
+CREATE TABLE IF NOT EXISTS segments (
+  owner INTEGER NOT NULL,
+  identity BLOB NOT NULL,
+  position BLOB NOT NULL,
+  PRIMARY KEY (owner, identity)
+) STRICT, WITHOUT ROWID)";
+constexpr const char* kSetVersion = "PRAGMA user_version = 2";
 
-std::int64_t schemaVersion(SqliteConnection& connection) {
-  return connection.integer("PRAGMA user_version");
+bool isKnown(std::int64_t version) {
+  return version >= kFirstSchemaVersion && version <= kSchemaVersion;
 }
 
 bool hasTables(SqliteConnection& connection) {
@@ -56,10 +60,11 @@ bool hasTables(SqliteConnection& connection) {
     throw StoreFailure{StoreFault::Foreign,
                        "holds the tables of another program and is left alone: move it away"};
   }
-  throw StoreFailure{StoreFault::Foreign,
-                     "has schema version " + std::to_string(version) +
-                         ", which this program does not know (it knows 1), and is left alone: "
-                         "update tavrel, or move the file away"};
+  throw StoreFailure{
+      StoreFault::Foreign,
+      "has schema version " + std::to_string(version) +
+          ", which this program does not know (it knows 1 and 2), and is left alone: "
+          "update tavrel, or move the file away"};
 }
 
 // Opening a pipe or a device in place of the store could block for ever.
@@ -88,12 +93,59 @@ bool hasLog(const std::string& path) {
 // True when the store has tables to read.
 bool isReadable(SqliteConnection& connection) {
   const std::int64_t version = schemaVersion(connection);
-  if (version == kSchemaVersion) return true;
+  if (isKnown(version)) return true;
   if (version != 0 || hasTables(connection)) refuseSchema(version);
   return false;
 }
 
 }  // namespace
+
+std::string store_sql::scalars(std::string_view rows) {
+  return std::string("SELECT key, day, value FROM scalars ").append(rows);
+}
+
+std::string store_sql::distributions(std::string_view rows, std::int64_t version) {
+  const std::string place = version == 1 ? "series" : "runs";
+  return ("SELECT key, day, count, " + place + " FROM distributions ").append(rows);
+}
+
+std::int64_t schemaVersion(SqliteConnection& connection) {
+  return connection.integer("PRAGMA user_version");
+}
+
+void migrate(SqliteConnection& connection) {
+  try {
+    connection.execute("ALTER TABLE distributions RENAME TO series");
+    connection.execute(kDistributionsTable);
+    {
+      SqliteStatement from(connection, "SELECT day, key, count, series FROM series");
+      SqliteStatement to(
+          connection, "INSERT INTO distributions (day, key, count, runs) VALUES (?1, ?2, ?3, ?4)");
+      std::string runs;
+      while (from.step()) {
+        runs.clear();
+        const std::int64_t count = from.integer(2);
+        // Without a run, a row that refers to nothing stays one.
+        const auto run = runOfSeries(from.integer(3), count);
+        if (run && count > 0) appendRun(runs, *run);
+        to.bind(1, from.integer(0));
+        to.bind(2, from.bytes(1));
+        to.bind(3, count);
+        to.bind(4, std::string_view(runs));
+        to.run();
+      }
+    }
+    // The chunks stay: only the rows that refer to them are written anew.
+    connection.execute("DROP TABLE series");
+    connection.execute(kSegmentsTable);
+    connection.execute(kSetVersion);
+    connection.execute("COMMIT");
+  } catch (const StoreFailure& failure) {
+    throw StoreFailure{
+        failure.fault,
+        "cannot be converted to schema version 2 and stays readable: " + failure.message};
+  }
+}
 
 SqliteConnection openStoreForWriting(const std::string& path,
                                      const std::shared_ptr<BusyBudget>& busy) {
@@ -112,16 +164,20 @@ SqliteConnection openStoreForWriting(const std::string& path,
       if (hasTables(connection)) refuseSchema(version);
       connection.execute(kPageSize);
       connection.execute("PRAGMA journal_mode = WAL; BEGIN IMMEDIATE");
-      connection.execute(kSchema);
+      for (const char* statement :
+           {kScalarsTable, kDistributionsTable, kChunksTable, kSegmentsTable, kSetVersion}) {
+        connection.execute(statement);
+      }
       connection.execute("COMMIT");
       version = schemaVersion(connection);
     }
   }
-  if (version != kSchemaVersion) refuseSchema(version);
-  // Commits are few and hold a whole run's values, so each is flushed: what was reported as kept
-  // also survives a power cut.
+  if (!isKnown(version)) refuseSchema(version);
+  // Each commit is flushed: what was reported as kept also survives a power cut.
   connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
-  connection.execute(kAutomaticCheckpoint);
+  // SQLite's own checkpoint leaves the log's content there. The next process to open the store
+  // would not know that it has been moved, and would move it again.
+  connection.execute("PRAGMA wal_autocheckpoint = 0");
   return connection;
 }
 
@@ -132,21 +188,22 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
   // Taken before looking at the log: whatever a writer moves from the log into the file after this
   // changes the version.
   const auto version = FileVersion::of(path);
-  const auto openLockless = [&]() -> std::optional<ReadableStore> {
-    SqliteConnection connection(path, SqliteConnection::Access::Immutable, busy);
+  using Access = SqliteConnection::Access;
+  const auto openAs = [&](Access access) -> std::optional<ReadableStore> {
+    SqliteConnection connection(path, access, busy);
     if (!isReadable(connection)) return std::nullopt;
-    return ReadableStore{std::move(connection), version};
+    return ReadableStore{std::move(connection),
+                         access == Access::Immutable ? version : std::nullopt};
   };
-  if (leavesNoTrace && version && !hasLog(path)) return openLockless();
+  if (leavesNoTrace && version && !hasLog(path)) return openAs(Access::Immutable);
   try {
-    SqliteConnection connection(path, SqliteConnection::Access::Read, busy);
-    if (!isReadable(connection)) return std::nullopt;
-    return ReadableStore{std::move(connection), std::nullopt};
+    return openAs(Access::Read);
   } catch (const StoreFailure& failure) {
     // Using the log needs files in the store's folder, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
     if (hasLog(path)) {
-      if (failure.fault == StoreFault::Device) throw;
+      if (failure.fault == StoreFault::Device) return openAs(Access::Alone);
+      if (faccessat(AT_FDCWD, path.c_str(), R_OK, AT_EACCESS) != 0) throw;
       throw StoreFailure{failure.fault,
                          failure.message +
                              "; its write-ahead log is only readable where the folder can be "
@@ -154,7 +211,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
     }
   }
   // Without a log, everything is in the file itself.
-  return openLockless();
+  return openAs(Access::Immutable);
 }
 
 }  // namespace tavrel

@@ -2,7 +2,7 @@
 // the tables for users of other tools.
 #pragma once
 
-#include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <optional>
 #include <string>
@@ -13,53 +13,48 @@
 
 namespace tavrel {
 
+/// The versions of the schema that this program reads. It writes the later one.
+inline constexpr std::int64_t kFirstSchemaVersion = 1;
+inline constexpr std::int64_t kSchemaVersion = 2;
+
 namespace store_sql {
 
 /// ?1 day, ?2 lowest key. The rows come from one walk along the primary key.
-inline constexpr std::string_view kScalarsOfDay =
-    "SELECT key, day, value FROM scalars WHERE day = ?1 AND key >= ?2 ORDER BY key";
-inline constexpr std::string_view kDistributionsOfDay =
-    "SELECT key, day, series, count FROM distributions WHERE day = ?1 AND key >= ?2 ORDER BY key";
+inline constexpr std::string_view kOfDay = "WHERE day = ?1 AND key >= ?2 ORDER BY key";
 
 /// ?1 first day, ?2 last day, ?3 lowest key, ?4 the key above the highest or null.
-inline constexpr std::string_view kScalarsByKey =
-    "SELECT key, day, value FROM scalars WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
-    "AND (?4 IS NULL OR key < ?4) ORDER BY key, day";
-inline constexpr std::string_view kDistributionsByKey =
-    "SELECT key, day, series, count FROM distributions WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
-    "AND (?4 IS NULL OR key < ?4) ORDER BY key, day";
+inline constexpr std::string_view kByKey =
+    "WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4) ORDER BY key, day";
 
 /// As above, in the order in which the rows are kept.
-inline constexpr std::string_view kScalarsByDay =
-    "SELECT key, day, value FROM scalars WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
-    "AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
-inline constexpr std::string_view kDistributionsByDay =
-    "SELECT key, day, series, count FROM distributions WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 "
-    "AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
+inline constexpr std::string_view kByDay =
+    "WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
 
 /// ?1 day, ?2 key, ?3 last day. The first row that is not before that key of that day.
-inline constexpr std::string_view kNextScalar =
-    "SELECT key, day, value FROM scalars WHERE (day, key) >= (?1, ?2) AND day <= ?3 "
-    "ORDER BY day, key LIMIT 1";
-inline constexpr std::string_view kNextDistribution =
-    "SELECT key, day, series, count FROM distributions WHERE (day, key) >= (?1, ?2) AND day <= ?3 "
-    "ORDER BY day, key LIMIT 1";
+inline constexpr std::string_view kNext =
+    "WHERE (day, key) >= (?1, ?2) AND day <= ?3 ORDER BY day, key LIMIT 1";
+
+/// One of the above, with the rows' key, day and value.
+std::string scalars(std::string_view rows);
+
+/// One of the above, with the rows' key, day and count, and the place of the values: runs
+/// (chunk_runs.h), or a series in version 1.
+std::string distributions(std::string_view rows, std::int64_t version);
 
 /// ?1 first chunk, ?2 chunk behind the last.
 inline constexpr std::string_view kChunks =
-    "SELECT data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
+    "SELECT chunk, data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
 
 }  // namespace store_sql
 
-/// A chunk's number is its series' number and, in the low bits, its place in the series.
-inline constexpr int kChunkOrdinalBits = 20;
+/// The version of the store's schema; 0 for an empty file.
+std::int64_t schemaVersion(SqliteConnection& connection);
 
-/// Every chunk of a series but the last is full. 12 KiB is little enough that one more value does
-/// not rewrite much, and enough that a million values take a thousand steps to read; five chunks
-/// fill a page.
-inline constexpr std::size_t kValuesPerChunk = 1024;
+/// Gives a store of version 1 the present schema, in the transaction that has begun, and ends it.
+void migrate(SqliteConnection& connection);
 
-/// Opens the store for writing and gives an empty file the schema. The folder must exist.
+/// Opens the store for writing and gives an empty file the schema; a store of version 1 keeps its
+/// own. The folder must exist.
 SqliteConnection openStoreForWriting(const std::string& path,
                                      const std::shared_ptr<BusyBudget>& busy);
 

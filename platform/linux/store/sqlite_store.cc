@@ -79,12 +79,18 @@ std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
 }
 
 bool SqliteStore::commit() {
+  std::optional<SqliteConnection> connection;
+  return commit(connection);
+}
+
+bool SqliteStore::commit(std::optional<SqliteConnection>& connection) {
   if (pending_.empty() && !KeptValues(site_.path).exist()) return true;
-  const auto failure = attempt([this](const auto&) {
+  const auto failure = attempt([&](const auto&) {
     SqliteBatch batch(openForWriting(), site_);
     for (const auto& [name, value] : pending_)
       batch.putScalar(name.first, name.second, value);
     batch.finish();
+    connection = batch.release();
   });
   if (failure && !keep(*failure)) return false;
   pending_.clear();
@@ -119,19 +125,20 @@ bool SqliteStore::keep(const StoreFailure& failure) {
 }
 
 bool SqliteStore::BHClientCheckpoint() {
-  const bool areKept = commit();
-  checkpoint();
+  std::optional<SqliteConnection> connection;
+  const bool areKept = commit(connection);
+  checkpoint(std::move(connection));
   return areKept;
 }
 
-void SqliteStore::checkpoint() {
-  // The last process that closes the store empties its log and removes it.
-  if (!FileIdentity::of(site_.path + "-wal")) return;
-  const auto failure = attempt([this](const auto& identity) {
+void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
+  const auto log = FileSystem::status(site_.path + "-wal");
+  if (!log || log->st_size == 0) return;
+  const auto failure = attempt([&](const auto& identity) {
     // The store has just been set aside with its log.
     if (!identity) return;
-    SqliteConnection connection = openForWriting();
-    if (!connection.checkpoint()) {
+    if (!connection) connection = openForWriting();
+    if (!connection->checkpoint()) {
       site_.log.write(LogLevel::Default,
                       site_.describe({StoreFault::Busy,
                                       "other processes still use the write-ahead log: what they "

@@ -66,7 +66,10 @@ class SqliteStore : public StatisticsStore {
   SqliteConnection openForWriting();
   /// Keeps the values that a failure has left uncommitted. False when they could not be kept.
   bool keep(const StoreFailure& failure);
-  void checkpoint();
+  /// As above; hands on the connection when something was committed.
+  bool commit(std::optional<SqliteConnection>& connection);
+  /// Opens the store when there is a log and no connection.
+  void checkpoint(std::optional<SqliteConnection> connection);
   std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);
 
   /// Runs `operation` with the identity of the store's file. When it finds the store damaged, sets

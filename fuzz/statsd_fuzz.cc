@@ -1,0 +1,38 @@
+// Datagrams of StatsD lines, by way of their parser and of the recorder.
+#include <cmath>
+#include <cstdint>
+#include <cstdlib>
+
+#include "statsd/statsd_line.h"
+#include "statsd/statsd_recorder.h"
+
+namespace {
+
+void require(bool holds) {
+  if (!holds) std::abort();
+}
+
+void checkLine(std::string_view text) {
+  tavrel::StatsdLine line;
+  if (tavrel::parseStatsdLine(text, line) != tavrel::StatsdParse::Good) return;
+  require(!line.name.empty() && text.starts_with(line.name));
+  require(!line.values.empty() && line.values.size() <= text.size());
+  for (const double value : line.values)
+    require(std::isfinite(value));
+  require(line.rate > 0 && line.rate <= 1);
+
+  std::string key;
+  tavrel::appendStatsdKey(key, line.name);
+  require(key.size() == line.name.size());
+  require(key.size() > 200 || tavrel::isStatsdPrefix(key));
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  const std::string_view datagram(reinterpret_cast<const char*>(data), size);
+  checkLine(datagram.substr(0, datagram.find('\n')));
+  tavrel::StatsdRecorder recorder("fuzz.");
+  recorder.take(datagram);
+  return 0;
+}

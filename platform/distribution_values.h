@@ -1,0 +1,60 @@
+// The packed form in which the values of a distribution are stored and passed on.
+//
+// Values and their offsets are kept apart, so that whoever wants the values alone reads no more.
+// A value has 8 bytes: the double's 64 bits, little-endian. An offset has 4 bytes: seconds within
+// the day, little-endian. They are adjacent, in the order of recording, at any alignment.
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <span>
+#include <string>
+#include <string_view>
+
+#include "base/bytes.h"
+
+namespace tavrel {
+
+inline constexpr std::size_t kPackedValueBytes = 8;
+inline constexpr std::size_t kPackedOffsetBytes = 4;
+
+struct DistributionSample {
+  double value = 0;
+  std::uint32_t secondsInDayOffset = 0;
+};
+
+/// Packed values and, when they were asked for, as many packed offsets.
+struct DistributionBlock {
+  std::string_view values;
+  std::string_view offsets;
+};
+
+/// Appends to packed values and to their packed offsets.
+inline void appendPacked(std::string& values, std::string& offsets,
+                         std::span<const DistributionSample> samples) {
+  std::size_t value = values.size();
+  std::size_t offset = offsets.size();
+  values.resize(value + samples.size() * kPackedValueBytes);
+  offsets.resize(offset + samples.size() * kPackedOffsetBytes);
+  const MutableByteSpan valueBytes = std::as_writable_bytes(std::span(values));
+  const MutableByteSpan offsetBytes = std::as_writable_bytes(std::span(offsets));
+  for (const DistributionSample& sample : samples) {
+    storeLittle64(valueBytes, value, std::bit_cast<std::uint64_t>(sample.value));
+    storeLittle32(offsetBytes, offset, sample.secondsInDayOffset);
+    value += kPackedValueBytes;
+    offset += kPackedOffsetBytes;
+  }
+}
+
+/// The value whose bytes begin at `value`.
+inline double packedValueAt(const char* value) {
+  return std::bit_cast<double>(*loadLittle64(asBytes({value, kPackedValueBytes}), 0));
+}
+
+/// The offset whose bytes begin at `offset`.
+inline std::uint32_t packedOffsetAt(const char* offset) {
+  return *loadLittle32(asBytes({offset, kPackedOffsetBytes}), 0);
+}
+
+}  // namespace tavrel

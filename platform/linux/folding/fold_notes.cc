@@ -1,0 +1,75 @@
+#include "platform/linux/folding/fold_notes.h"
+
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include "base/bytes.h"
+#include "base/limits.h"
+#include "platform/linux/files/digests.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kLockPath = "/run/tavrel/fold.lock";
+
+// Lines that are remembered. Those beyond `limits::kFoldRefusalLines` only to count each once.
+constexpr std::size_t kRemembered = 8192;
+
+}  // namespace
+
+Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, SystemLog& log) {
+  Expected<Descriptor> file = files.lockFile(root.path(kLockPath));
+  if (!file) return file.error();
+  return FoldNotes(*std::move(file), log);
+}
+
+FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), log_(log) {
+  std::string content(kRemembered * sizeof(std::uint64_t), '\0');
+  const ssize_t size = pread(file_.get(), content.data(), content.size(), 0);
+  content.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
+  for (std::size_t at = 0; at + 8 <= content.size(); at += 8)
+    told_.insert(*loadLittle64(asBytes(content), at));
+}
+
+bool FoldNotes::tell(std::string_view line) {
+  const auto digest = sha256(asBytes(line));
+  if (told_.size() >= kRemembered || !told_.insert(*loadLittle64(digest, 0)).second) return false;
+  hasChanged_ = true;
+  if (told_.size() <= limits::kFoldRefusalLines) {
+    log_.write(LogLevel::Error, line);
+  } else {
+    ++leftOut_;
+  }
+  return true;
+}
+
+void FoldNotes::mark() {
+  // The kernel's own stamps are too coarse to tell two marks apart.
+  timespec times[2]{};
+  clock_gettime(CLOCK_REALTIME, &times[0]);
+  times[1] = times[0];
+  futimens(file_.get(), times);
+}
+
+timespec FoldNotes::lastMark(const DeviceRoot& root) {
+  const auto status = FileSystem::status(root.path(kLockPath));
+  return status ? status->st_mtim : timespec{};
+}
+
+void FoldNotes::save() {
+  if (leftOut_ > 0) {
+    log_.log(LogLevel::Error, "%llu more refusals of this fold are not told", leftOut_);
+  }
+  if (!hasChanged_) return;
+  std::string content;
+  for (const std::uint64_t told : told_) {
+    std::array<std::byte, 8> bytes;
+    storeLittle64(bytes, 0, told);
+    content += asText(bytes);
+  }
+  if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
+    log_.log(LogLevel::Error, "cannot write %s: refusals will be told again", kLockPath);
+  }
+}
+
+}  // namespace tavrel

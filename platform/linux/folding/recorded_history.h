@@ -1,0 +1,48 @@
+// The store and what waits for the next fold, read as one.
+//
+//   auto history = RecordedHistory::open(root, store, recorders, selection);
+//   if (history) history->walkScalars(handler);
+#pragma once
+
+#include <memory>
+#include <optional>
+#include <string>
+
+#include "base/expected.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/waiting_values.h"
+#include "platform/linux/store/sqlite_history.h"
+#include "platform/linux/store/sqlite_store.h"
+
+namespace tavrel {
+
+class RecordedHistory {
+ public:
+  /// Later changes of the store and of the segments are not seen. Where this user may not read the
+  /// store, only what waits is read, and `warning` says so.
+  static Expected<RecordedHistory> open(const DeviceRoot& root, SqliteStore& store,
+                                        const Recorders& recorders, RowSelection selection);
+
+  /// The selected rows, as `SqliteHistory` walks them: by day, then by key.
+  Status walkScalars(const BHHistory::ScalarRowHandler& rowHandler);
+  Status walkDistributions(const SqliteHistory::CountedRowHandler& rowHandler);
+
+  /// The first and the last day with a row, selected or not; nothing when there is none.
+  Expected<std::optional<SqliteHistory::DaySpan>> daysHeld();
+
+  /// What is missing, for people.
+  const std::optional<std::string>& warning() const { return warning_; }
+
+ private:
+  RecordedHistory() = default;
+  Status walkStoredScalars(const BHHistory::ScalarRowHandler& rowHandler);
+  Status walkStoredDistributions(const SqliteHistory::CountedRowHandler& rowHandler);
+
+  RowSelection selection_;
+  std::unique_ptr<SqliteHistory> stored_;  // may be missing
+  std::optional<WaitingValues> waiting_;   // nothing without a folder
+  std::optional<std::string> warning_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,104 @@
+#include "platform/linux/folding/recorders.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <optional>
+#include <pwd.h>
+#include <unistd.h>
+
+#include "base/limits.h"
+#include "base/text.h"
+#include "client/segment_format.h"
+#include "platform/linux/files/property_list_file.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kRecordersPath = "/etc/tavrel/recorders.plist";
+constexpr std::string_view kSystemPrefix = "com.norvane.";
+
+std::optional<std::uint32_t> userNumber(std::string_view user) {
+  std::uint32_t number = 0;
+  const char* const end = user.data() + user.size();
+  if (const auto [stop, error] = std::from_chars(user.data(), end, number);
+      error == std::errc{} && stop == end) {
+    return number;
+  }
+  std::array<char, 4096> text;
+  passwd entry{};
+  passwd* found = nullptr;
+  if (getpwnam_r(std::string(user).c_str(), &entry, text.data(), text.size(), &found) != 0 ||
+      found == nullptr) {
+    return std::nullopt;
+  }
+  return found->pw_uid;
+}
+
+}  // namespace
+
+Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
+                          PropertyListCoding& propertyLists, SystemLog& log) {
+  Recorders recorders;
+  const std::string path = root.path(kRecordersPath);
+  const auto status = FileSystem::status(path);
+  if (!status) return recorders;
+  const bool isTrusted = (status->st_uid == 0 || status->st_uid == geteuid()) &&
+                         (status->st_mode & (S_IWGRP | S_IWOTH)) == 0;
+  if (!isTrusted) {
+    log.log(LogLevel::Error,
+            "%s is ignored: others than root may write it; make root its owner, with mode 0644",
+            path);
+    return recorders;
+  }
+  const plist::Dictionary content = readDictionaryFile(files, propertyLists, log, path);
+  if (!content) return recorders;
+  for (const plist::Entry& entry : content)
+    recorders.add(entry.key.view(), entry.value, path, log);
+  return recorders;
+}
+
+void Recorders::add(std::string_view user, const plist::Value& prefixes, const std::string& path,
+                    SystemLog& log) {
+  const auto refuse = [&](std::string_view reason) {
+    std::string shown;
+    appendQuoted(shown, user.substr(0, 60));
+    log.log(LogLevel::Error, "%s: the entry %s is ignored: %s", path, shown, reason);
+  };
+  const auto number = userNumber(user);
+  if (!number) return refuse("there is no such user");
+  const plist::Array array = prefixes.array();
+  if (!array) return refuse("give an array of prefixes");
+  const bool areGood = std::all_of(array.begin(), array.end(), [](const plist::Value& prefix) {
+    const auto text = prefix.string();
+    return text && !text->empty() && text->size() <= kBHLongestName;
+  });
+  if (!areGood) return refuse("a prefix is a text of 1 to 1024 bytes");
+  listed_.insert(*number);
+  for (const plist::Value& prefix : array)
+    users_[std::string(*prefix.string())].insert(*number);
+}
+
+Recorders::Users::const_iterator Recorders::longestPrefixOf(std::string_view key) const {
+  std::string_view rest = key;
+  for (auto next = users_.upper_bound(rest); next != users_.begin();
+       next = users_.upper_bound(rest)) {
+    --next;
+    const std::string_view below = next->first;
+    if (rest.starts_with(below)) return next;
+    // A shorter prefix of the key is one of what both have in common.
+    const auto difference = std::mismatch(rest.begin(), rest.end(), below.begin(), below.end());
+    rest = rest.substr(0, static_cast<std::size_t>(difference.first - rest.begin()));
+  }
+  return users_.end();
+}
+
+bool Recorders::mayRecord(std::uint32_t user, std::string_view key) const {
+  if (user == 0) return true;
+  const auto prefix = longestPrefixOf(key);
+  const bool isSystems = key.starts_with(kSystemPrefix);
+  if (prefix == users_.end()) return !isSystems && !listed_.contains(user);
+  return prefix->second.contains(user) && (!isSystems || prefix->first.starts_with(kSystemPrefix));
+}
+
+}  // namespace tavrel

@@ -1,0 +1,60 @@
+// Changes of scalars that several segments yield, until one transaction takes them.
+//
+// Of sets of one row the latest counts, by the time that its program saw; adds are added to it.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <string>
+#include <string_view>
+#include <utility>
+
+#include "base/expected.h"
+#include "platform/linux/store/sqlite_batch.h"
+
+namespace tavrel {
+
+/// The name of a row in the store: its day and its key.
+using RowName = std::pair<std::int32_t, std::string>;
+
+/// In the order in which the store's rows are read.
+struct LessRowName {
+  using is_transparent = void;
+  template <class A, class B>
+  bool operator()(const A& a, const B& b) const {
+    if (a.first != b.first) return a.first < b.first;
+    return std::string_view(a.second) < std::string_view(b.second);
+  }
+};
+template <class Row>
+using RowMap = std::map<RowName, Row, LessRowName>;
+
+class ScalarChanges {
+ public:
+  struct Change {
+    bool isSet = false;
+    std::int64_t value = 0;  // of the set
+    std::int64_t added = 0;
+  };
+
+  void set(std::int32_t day, std::string_view key, std::int64_t value);
+  void add(std::int32_t day, std::string_view key, std::int64_t amount);
+
+  const RowMap<Change>& rows() const { return changes_; }
+  /// Of the keys.
+  std::size_t bytes() const { return bytes_; }
+  /// Changes that would take a value beyond 64 bits, and are left out.
+  std::uint64_t overflows() const { return overflows_; }
+
+  Status giveTo(SqliteBatch& batch);
+
+ private:
+  Change& changeOf(std::int32_t day, std::string_view key);
+
+  RowMap<Change> changes_;
+  std::size_t bytes_ = 0;
+  std::uint64_t overflows_ = 0;
+};
+
+}  // namespace tavrel

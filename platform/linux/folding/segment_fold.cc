@@ -1,0 +1,289 @@
+#include "platform/linux/folding/segment_fold.h"
+
+#include <algorithm>
+#include <map>
+#include <set>
+#include <utility>
+#include <vector>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "base/text.h"
+#include "platform/linux/folding/fold_notes.h"
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/scalar_changes.h"
+#include "platform/linux/folding/segment_folder.h"
+#include "platform/linux/folding/segment_intake.h"
+#include "platform/linux/segments/segment_writer.h"
+
+namespace tavrel {
+namespace {
+
+struct LessName {
+  bool operator()(const SegmentName& a, const SegmentName& b) const {
+    return std::pair(a.owner, a.identity) < std::pair(b.owner, b.identity);
+  }
+};
+using SegmentNames = std::set<SegmentName, LessName>;
+
+// What is done with a segment once the store has taken its values.
+struct FoldedSegment {
+  OpenSegment segment;
+  SegmentProgress progress;
+  bool isOver;  // nobody can write to it, and nothing is left in it
+};
+
+Status giveTo(SqliteBatch& batch, const SegmentIntake& intake) {
+  Status done = Done{};
+  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
+    if (done) done = batch.appendValues(day, key, samples);
+  });
+  return done;
+}
+
+class FoldRun {
+ public:
+  FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
+          const Recorders& recorders, FoldReport& report)
+      : folder_(folder), store_(store), notes_(notes), recorders_(recorders), report_(report) {}
+
+  Status run(const SegmentFolder::Listing& listing);
+
+ private:
+  Status fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& segments);
+  Status take(SqliteBatch& batch, const SegmentEntry& entry);
+  Status takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
+                    const SegmentName& name, bool isWriterGone);
+  Status dropPositions(SqliteBatch& batch);
+  bool mustWait(const SegmentName& name);
+  void refuse(std::string_view line);
+  void finishSegments();
+
+  const SegmentFolder& folder_;
+  SqliteStore& store_;
+  FoldNotes& notes_;
+  const Recorders& recorders_;
+  FoldReport& report_;
+  const BootInstant boot_ = currentBootInstant();
+
+  FoldedRows rows_;
+  std::optional<SegmentNames> known_;               // whose positions the store holds
+  std::map<std::uint32_t, std::size_t> positions_;  // of each user
+  SegmentNames found_;
+  std::set<std::uint32_t> unseen_;  // users with segments whose identities are not known
+  std::map<std::uint32_t, std::uint64_t> values_;
+  std::set<std::uint32_t> toldUsers_;
+  std::size_t next_ = 0;  // in the listing
+
+  // Of the current transaction.
+  FoldReport counts_;
+  ScalarChanges changes_;
+  std::vector<FoldedSegment> folded_;
+};
+
+Status FoldRun::run(const SegmentFolder::Listing& listing) {
+  for (const auto& [owner, count] : listing.leftOut) {
+    unseen_.insert(owner);
+    report_.waiting += count;
+  }
+  for (const std::string& line : listing.refusals)
+    refuse(line);
+  if (listing.segments.empty() && counts_.segmentsRefused == 0) return Done{};
+  do {
+    const auto batch = store_.beginBatch();
+    if (!batch) return batch.error();
+    Status done = fillBatch(**batch, listing.segments);
+    if (done) done = (*batch)->commit();
+    if (!done) return done;
+    finishSegments();
+  } while (next_ < listing.segments.size());
+  return Done{};
+}
+
+void FoldRun::refuse(std::string_view line) {
+  if (notes_.tell(line)) ++counts_.segmentsRefused;
+}
+
+Status FoldRun::fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& segments) {
+  if (!known_) {
+    const auto names = batch.segmentNames();
+    if (!names) return names.error();
+    known_.emplace(names->begin(), names->end());
+    for (const SegmentName& name : *known_)
+      ++positions_[name.owner];
+  }
+  while (next_ < segments.size() && folded_.size() < limits::kFoldSegmentsAtOnce &&
+         counts_.values < limits::kFoldValuesAtOnce && changes_.bytes() < limits::kFoldKeyBytes) {
+    if (Status done = take(batch, segments[next_++]); !done) return done;
+  }
+  if (next_ == segments.size()) {
+    if (Status done = dropPositions(batch); !done) return done;
+  }
+  if (Status done = changes_.giveTo(batch); !done) return done;
+  counts_.refused += changes_.overflows();
+  const std::pair<const char*, std::uint64_t> figures[] = {
+      {"com.norvane.brimhold.dropped", counts_.dropped},
+      {"com.norvane.brimhold.refused", counts_.refused},
+      {"com.norvane.brimhold.segments_refused", counts_.segmentsRefused},
+  };
+  ScalarChanges own;
+  for (const auto& [key, count] : figures) {
+    if (count > 0) own.add(store_.BHDaysSince1970(), key, static_cast<std::int64_t>(count));
+  }
+  return own.giveTo(batch);
+}
+
+Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
+  auto segment = folder_.openSegment(entry);
+  if (!segment) {
+    unseen_.insert(entry.owner);
+    refuse(segment.error().message);
+    return Done{};
+  }
+  if (!*segment) return Done{};
+  const std::uint32_t owner = (*segment)->entry.owner;
+  SegmentReader reader((*segment)->file.get());
+  const SegmentFacts facts = reader.facts();
+  // Asked first: what is read after the last writer has gone is all that there is.
+  const bool isWriterGone = findSegmentWriter((*segment)->file.get(), facts) == SegmentWriter::Gone;
+  const auto state = reader.state();
+  if (!state) {
+    refuse(folder_.refusal(entry.name, state.error().message));
+    return Done{};
+  }
+  if (*state == SegmentReader::State::Empty) {
+    if (isWriterGone) folded_.push_back({*std::move(*segment), {}, true});
+    return Done{};
+  }
+  const SegmentName name{owner, facts.identity};
+  if (!found_.insert(name).second) {
+    refuse(folder_.refusal(entry.name, "a copy of another segment"));
+    return Done{};
+  }
+  if (mustWait(name)) {
+    ++report_.waiting;
+    return Done{};
+  }
+  return takeValues(batch, *std::move(*segment), reader, name, isWriterGone);
+}
+
+bool FoldRun::mustWait(const SegmentName& name) {
+  std::uint64_t& ofUser = values_[name.owner];
+  if (ofUser >= limits::kFoldValuesPerUser ||
+      report_.values + counts_.values >= limits::kFoldValues) {
+    return true;
+  }
+  if (known_->contains(name)) return false;
+  return ++positions_[name.owner] > limits::kSegmentsPerUser;
+}
+
+Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
+                           const SegmentName& name, bool isWriterGone) {
+  SegmentPosition position;
+  std::string before;
+  if (known_->contains(name)) {
+    auto stored = batch.segmentPosition(name.owner, name.identity);
+    if (!stored) return stored.error();
+    if (*stored) before = **stored;
+    if (auto decoded = SegmentPosition::decode(before)) {
+      position = *std::move(decoded);
+    } else if (!before.empty()) {
+      notes_.tell("a segment of user " + std::to_string(name.owner) +
+                  " waits: another version of this program began to fold it; restart the device");
+      ++report_.waiting;
+      return Done{};
+    }
+  }
+  SegmentIntake intake(name.owner, recorders_, rows_, changes_);
+  SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
+  if (Status done = giveTo(batch, intake); !done) return done;
+  if (const std::string after = position.encode(); after != before) {
+    if (Status done = batch.setSegmentPosition(name.owner, name.identity, after); !done) {
+      return done;
+    }
+  }
+  if (!intake.foreignKey().empty() && toldUsers_.insert(name.owner).second) {
+    std::string key;
+    appendQuoted(key, std::string_view(intake.foreignKey()).substr(0, 80));
+    notes_.tell(
+        format("user %u may not record %s, and such values are refused: give the user a "
+               "prefix in /etc/tavrel/recorders.plist, or use another key",
+               name.owner, key));
+  }
+  ++counts_.segments;
+  counts_.scalars += intake.scalars();
+  counts_.values += intake.values();
+  values_[name.owner] += intake.values();
+  counts_.refused += intake.refused() + progress.refused;
+  counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
+  const bool isOver = isWriterGone && progress.isComplete;
+  if (isOver || !progress.acknowledgements.empty()) {
+    folded_.push_back({std::move(segment), std::move(progress), isOver});
+  }
+  return Done{};
+}
+
+// Of segments that an earlier fold removed, or that went with the memory that held them.
+Status FoldRun::dropPositions(SqliteBatch& batch) {
+  for (const SegmentName& name : *known_) {
+    if (found_.contains(name) || unseen_.contains(name.owner)) continue;
+    if (Status done = batch.removeSegmentPosition(name.owner, name.identity); !done) return done;
+  }
+  return Done{};
+}
+
+void FoldRun::finishSegments() {
+  if (!folded_.empty()) notes_.mark();
+  for (const FoldedSegment& folded : folded_) {
+    if (folded.isOver) {
+      if (folder_.remove(folded.segment)) ++counts_.removed;
+      continue;
+    }
+    // What cannot be given back now is given back by the next fold.
+    if (const Descriptor file = folder_.openToAcknowledge(folded.segment)) {
+      static_cast<void>(acknowledge(file.get(), folded.progress));
+    }
+  }
+  folded_.clear();
+  changes_ = {};
+  report_.segments += counts_.segments;
+  report_.scalars += counts_.scalars;
+  report_.values += counts_.values;
+  report_.removed += counts_.removed;
+  report_.dropped += counts_.dropped;
+  report_.refused += counts_.refused;
+  report_.segmentsRefused += counts_.segmentsRefused;
+  counts_ = {};
+}
+
+}  // namespace
+
+FoldReport SegmentFold::run() {
+  FoldReport report;
+  const auto folder = SegmentFolder::open(root_);
+  if (!folder) {
+    report.failure = folder.error().message;
+    return report;
+  }
+  if (!*folder) return report;
+  report.hasFolder = true;
+  auto notes = FoldNotes::lock(root_, files_, log_);
+  if (!notes) {
+    report.failure = notes.error().message;
+    return report;
+  }
+  if (const Status cleared = (*folder)->clearRequest(); !cleared) {
+    notes->tell(cleared.error().message);
+  }
+  const SegmentFolder::Listing listing = (*folder)->list();
+  if (listing.segments.empty() && listing.refusals.empty()) return report;
+  const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
+  if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(listing);
+      !done) {
+    report.failure = done.error().message + "; what programs recorded waits for the next fold";
+  }
+  notes->save();
+  return report;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,183 @@
+#include "platform/linux/folding/segment_folder.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <dirent.h>
+#include <fcntl.h>
+#include <linux/magic.h>
+#include <memory>
+#include <random>
+#include <sys/vfs.h>
+#include <system_error>
+
+#include "base/limits.h"
+#include "base/text.h"
+#include "platform/linux/files/system_error.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kFolderPath = "/run/tavrel/stat";
+constexpr const char* kRequest = "fold-wanted";
+constexpr std::string_view kSegmentEnding = ".segment";
+
+struct CloseFolder {
+  void operator()(DIR* folder) const { closedir(folder); }
+};
+
+// Why a file is no segment, judged from outside; nothing for one that may be.
+const char* faultOf(const struct stat& status, dev_t device) {
+  if (S_ISLNK(status.st_mode)) return "a symbolic link";
+  if (!S_ISREG(status.st_mode)) return "not a regular file";
+  if (status.st_nlink != 1) return "a file with several names";
+  if (status.st_dev != device) return "on another file system";
+  return nullptr;
+}
+
+/// A random choice of at most `most` out of all that are offered.
+template <class Element>
+class Sample {
+ public:
+  explicit Sample(std::size_t most) : most_(most) {}
+
+  template <class Random>
+  void offer(Element element, Random& random) {
+    ++offered_;
+    if (chosen_.size() < most_) return chosen_.push_back(std::move(element));
+    const std::uint64_t place = random() % offered_;
+    if (place < most_) chosen_[place] = std::move(element);
+  }
+  std::vector<Element>& chosen() { return chosen_; }
+  std::uint64_t leftOut() const { return offered_ - chosen_.size(); }
+
+ private:
+  std::size_t most_;
+  std::uint64_t offered_ = 0;
+  std::vector<Element> chosen_;
+};
+
+}  // namespace
+
+Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& root) {
+  std::string path = root.path(kFolderPath);
+  Descriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+  if (!folder) {
+    if (errno == ENOENT) return std::optional<SegmentFolder>();
+    return systemError("open", path);
+  }
+  struct statfs fileSystem {};
+  struct stat status {};
+  if (fstatfs(folder.get(), &fileSystem) != 0 || fstat(folder.get(), &status) != 0) {
+    return systemError("examine", path);
+  }
+  if (fileSystem.f_type != TMPFS_MAGIC)
+    return Error{path + " is not on a tmpfs: nothing is folded"};
+  return std::optional(SegmentFolder(std::move(path), std::move(folder), status.st_dev));
+}
+
+SegmentFolder::Listing SegmentFolder::list() const {
+  Listing listing;
+  const auto refuse = [&](std::string_view name, std::string_view reason) {
+    if (listing.refusals.size() < limits::kListedRefusals) {
+      listing.refusals.push_back(refusal(name, reason));
+    }
+  };
+  const std::unique_ptr<DIR, CloseFolder> folder(
+      fdopendir(openat(folder_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC)));
+  if (!folder) return listing;
+  std::minstd_rand random(std::random_device{}());
+  std::map<std::uint32_t, Sample<std::string>> byOwner;
+  std::size_t entries = 0;
+  while (const dirent* const entry = readdir(folder.get())) {
+    const std::string_view name = entry->d_name;
+    if (name == "." || name == ".." || name == kRequest) continue;
+    if (++entries > limits::kSegmentFolderEntries) {
+      refuse(name, "the folder has too many files, and the rest is not looked at");
+      break;
+    }
+    if (!name.ends_with(kSegmentEnding)) {
+      refuse(name, "not the name of a segment");
+      continue;
+    }
+    struct stat status {};
+    if (fstatat(folder_.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
+    if (const char* const fault = faultOf(status, device_)) {
+      refuse(name, fault);
+      continue;
+    }
+    byOwner.try_emplace(status.st_uid, limits::kSegmentsPerUser)
+        .first->second.offer(std::string(name), random);
+  }
+  Sample<SegmentEntry> all(limits::kSegments);
+  std::map<std::uint32_t, std::uint64_t> chosen;
+  for (auto& [owner, names] : byOwner) {
+    for (std::string& name : names.chosen())
+      all.offer({std::move(name), owner}, random);
+  }
+  listing.segments = std::move(all.chosen());
+  for (const SegmentEntry& entry : listing.segments)
+    ++chosen[entry.owner];
+  for (auto& [owner, names] : byOwner) {
+    const std::uint64_t offered = names.chosen().size() + names.leftOut();
+    if (offered > chosen[owner]) listing.leftOut[owner] = offered - chosen[owner];
+  }
+  std::sort(listing.segments.begin(), listing.segments.end(),
+            [](const SegmentEntry& a, const SegmentEntry& b) { return a.name < b.name; });
+  return listing;
+}
+
+Expected<std::optional<OpenSegment>> SegmentFolder::openSegment(const SegmentEntry& entry) const {
+  const auto refuse = [&](std::string_view reason) { return Error{refusal(entry.name, reason)}; };
+  OpenSegment segment{entry,
+                      Descriptor(openat(folder_.get(), entry.name.c_str(),
+                                        O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)),
+                      0, 0};
+  if (!segment.file) {
+    if (errno == ENOENT) return std::optional<OpenSegment>();
+    return refuse(errno == ELOOP ? "a symbolic link" : std::generic_category().message(errno));
+  }
+  struct stat status {};
+  if (fstat(segment.file.get(), &status) != 0) return refuse("it cannot be examined");
+  // Removed since it was listed.
+  if (status.st_nlink == 0) return std::optional<OpenSegment>();
+  if (const char* const fault = faultOf(status, device_)) return refuse(fault);
+  segment.entry.owner = status.st_uid;
+  segment.device = status.st_dev;
+  segment.inode = status.st_ino;
+  return std::optional(std::move(segment));
+}
+
+Descriptor SegmentFolder::openToAcknowledge(const OpenSegment& segment) const {
+  Descriptor file(openat(folder_.get(), segment.entry.name.c_str(),
+                         O_WRONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC));
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0 || status.st_dev != segment.device ||
+      status.st_ino != segment.inode) {
+    return {};
+  }
+  return file;
+}
+
+bool SegmentFolder::remove(const OpenSegment& segment) const {
+  struct stat status {};
+  const char* const name = segment.entry.name.c_str();
+  return fstatat(folder_.get(), name, &status, AT_SYMLINK_NOFOLLOW) == 0 &&
+         status.st_dev == segment.device && status.st_ino == segment.inode &&
+         unlinkat(folder_.get(), name, 0) == 0;
+}
+
+std::string SegmentFolder::refusal(std::string_view name, std::string_view reason) const {
+  std::string line;
+  appendQuoted(line, name.substr(0, 80));
+  return line.append(" in ").append(path_).append(" is refused: ").append(reason) + "; remove it";
+}
+
+Status SegmentFolder::clearRequest() const {
+  if (unlinkat(folder_.get(), kRequest, 0) == 0 || errno == ENOENT) return Done{};
+  // Anybody may make a folder of that name.
+  const int code = errno;
+  if (unlinkat(folder_.get(), kRequest, AT_REMOVEDIR) == 0) return Done{};
+  return systemError("remove", path_ + "/" + kRequest, code);
+}
+
+}  // namespace tavrel

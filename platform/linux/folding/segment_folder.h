@@ -1,0 +1,73 @@
+// The folder in which programs leave their segments. Any user of its group creates files there, so
+// nothing of an entry is taken on trust, neither its name nor its kind.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <sys/stat.h>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/device_root.h"
+
+namespace tavrel {
+
+/// A file in the folder that looks like a segment from outside.
+struct SegmentEntry {
+  std::string name;
+  std::uint32_t owner = 0;
+};
+
+/// A segment that is open for reading.
+struct OpenSegment {
+  SegmentEntry entry;
+  Descriptor file;
+  dev_t device = 0;
+  ino_t inode = 0;
+};
+
+class SegmentFolder {
+ public:
+  /// Nothing when the device has no folder. An error when it is not on a tmpfs.
+  static Expected<std::optional<SegmentFolder>> open(const DeviceRoot& root);
+
+  const std::string& path() const { return path_; }
+
+  struct Listing {
+    std::vector<SegmentEntry> segments;  // by name: those that began earlier come first
+    /// Segments that were left out, by owner. Of too many, a random choice is listed, so that each
+    /// gets its turn.
+    std::map<std::uint32_t, std::uint64_t> leftOut;
+    std::vector<std::string> refusals;  // lines for people
+  };
+  /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all.
+  Listing list() const;
+
+  /// Opens a segment for reading. Nothing when it has gone. An error, for people, refuses it.
+  Expected<std::optional<OpenSegment>> openSegment(const SegmentEntry& entry) const;
+  /// Opens the same file for writing.
+  Descriptor openToAcknowledge(const OpenSegment& segment) const;
+  /// Removes the name, unless it belongs to another file by now.
+  bool remove(const OpenSegment& segment) const;
+
+  /// The line, for people, about a file that is refused.
+  std::string refusal(std::string_view name, std::string_view reason) const;
+
+  /// Takes the request for a fold back. An error when that is impossible.
+  Status clearRequest() const;
+
+ private:
+  SegmentFolder(std::string path, Descriptor folder, dev_t device)
+      : path_(std::move(path)), folder_(std::move(folder)), device_(device) {}
+
+  std::string path_;
+  Descriptor folder_;
+  dev_t device_;
+};
+
+}  // namespace tavrel

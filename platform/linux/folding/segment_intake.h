@@ -1,0 +1,82 @@
+// Takes what one segment yields, as far as rights and limits allow.
+#pragma once
+
+#include <cstdint>
+#include <limits>
+#include <map>
+#include <span>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "platform/distribution_values.h"
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/scalar_changes.h"
+#include "platform/linux/segments/segment_reader.h"
+
+namespace tavrel {
+
+/// The rows of the store that one fold changes.
+class FoldedRows {
+ public:
+  struct Row {
+    std::int64_t latestSet = std::numeric_limits<std::int64_t>::min();  // of a scalar
+  };
+
+  /// Nothing when the row would be one too many. The first user of a row is charged with it.
+  Row* find(std::uint32_t user, std::int32_t day, std::string_view key, bool isScalar);
+
+ private:
+  std::unordered_map<std::uint64_t, Row> rows_;  // by a keyed hash of its name
+  std::unordered_map<std::uint32_t, std::size_t> counts_;
+};
+
+class SegmentIntake final : public SegmentSink {
+ public:
+  /// All must outlive it. So must the reader of the segment.
+  SegmentIntake(std::uint32_t user, const Recorders& recorders, FoldedRows& rows,
+                ScalarChanges& changes)
+      : user_(user), recorders_(recorders), rows_(rows), changes_(changes) {}
+
+  void takeScalar(const SegmentScalar& scalar) override;
+  void takeRecord(const SegmentRecord& record) override;
+
+  /// Passes the measurements on, each key and day once: `take(day, key, samples)`. Scalars are in
+  /// the changes already.
+  template <class Take>
+  void eachSeries(Take take) const {
+    for (const auto& [name, series] : series_)
+      if (!series.isRefused) take(series.day, series.key, std::span(series.samples));
+  }
+
+  std::uint64_t scalars() const { return scalars_; }
+  std::uint64_t values() const { return values_; }
+  std::uint64_t refused() const { return refused_; }
+  /// The first key that the user may not record; empty when there was none.
+  const std::string& foreignKey() const { return foreignKey_; }
+
+ private:
+  // The measurements of a key and a day.
+  struct Series {
+    std::string_view key;
+    std::int32_t day = 0;
+    bool isRefused = false;
+    std::vector<DistributionSample> samples;
+  };
+  bool mayTake(std::string_view key, std::int32_t day);
+  Series& seriesOf(const SegmentRecord& record);
+
+  const std::uint32_t user_;
+  const Recorders& recorders_;
+  FoldedRows& rows_;
+  ScalarChanges& changes_;
+  std::map<std::pair<std::uint32_t, std::int32_t>, Series> series_;  // by key's number and day
+  std::vector<Series*> recent_;  // of each key, the one used last
+  std::uint64_t scalars_ = 0;
+  std::uint64_t values_ = 0;
+  std::uint64_t refused_ = 0;
+  std::string foreignKey_;
+};
+
+}  // namespace tavrel

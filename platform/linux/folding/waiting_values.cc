@@ -1,0 +1,123 @@
+#include "platform/linux/folding/waiting_values.h"
+
+#include <algorithm>
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include "base/limits.h"
+#include "platform/linux/files/system_error.h"
+#include "platform/linux/segments/segment_writer.h"
+
+namespace tavrel {
+namespace {
+
+// Passes on what is selected.
+class SelectingSink final : public SegmentSink {
+ public:
+  SelectingSink(const RowSelection& selection, SegmentIntake& intake)
+      : selection_(selection), intake_(intake) {}
+  void takeScalar(const SegmentScalar& scalar) override {
+    if (selection_.contains(scalar.day, scalar.key)) intake_.takeScalar(scalar);
+  }
+  void takeRecord(const SegmentRecord& record) override {
+    if (selection_.contains(record.day, record.key)) intake_.takeRecord(record);
+  }
+
+ private:
+  const RowSelection& selection_;
+  SegmentIntake& intake_;
+};
+
+}  // namespace
+
+Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const Recorders& recorders,
+                                            SqliteHistory* history, const RowSelection& selection) {
+  WaitingValues waiting;
+  if (selection.hasValues) {
+    waiting.copied_ = Descriptor(memfd_create("waiting values", MFD_CLOEXEC));
+    if (!waiting.copied_) return systemError("copy segments from", folder.path());
+  }
+  const SegmentFolder::Listing listing = folder.list();
+  for (const auto& [owner, count] : listing.leftOut)
+    waiting.leftOut_ += count;
+  FoldedRows rows;
+  for (const SegmentEntry& entry : listing.segments) {
+    if (waiting.blocks_ >= limits::kWaitingBlocks ||
+        waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
+      ++waiting.leftOut_;
+      continue;
+    }
+    const auto segment = folder.openSegment(entry);
+    // The fold tells what is refused.
+    if (!segment || !*segment) continue;
+    if (Status added = waiting.add(**segment, recorders, history, selection, rows); !added) {
+      return added.error();
+    }
+  }
+  return waiting;
+}
+
+Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders,
+                          SqliteHistory* history, const RowSelection& selection, FoldedRows& rows) {
+  SegmentReader reader(segment.file.get());
+  const SegmentFacts facts = reader.facts();
+  // A lease could be in the way of a fold.
+  const bool isWriterGone = findSegmentProcess(facts) == SegmentWriter::Gone;
+  const auto state = reader.state();
+  if (!state || *state != SegmentReader::State::Begun) return Done{};
+  SegmentPosition position;
+  if (history != nullptr && history->hasStore()) {
+    const auto stored = history->segmentPosition(segment.entry.owner, facts.identity);
+    if (!stored) return stored.error();
+    if (*stored) {
+      auto decoded = SegmentPosition::decode(**stored);
+      if (!decoded) return Done{};
+      position = *std::move(decoded);
+    }
+  }
+  SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_);
+  SelectingSink sink(selection, intake);
+  reader.read(position, currentBootInstant(), isWriterGone, sink);
+  Status added = Done{};
+  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
+    if (added) added = addSeries(selection, day, key, samples);
+  });
+  return added;
+}
+
+Status WaitingValues::addSeries(const RowSelection& selection, std::int32_t day,
+                                std::string_view key, std::span<const DistributionSample> samples) {
+  auto found = distributions_.find(std::pair(day, key));
+  if (found == distributions_.end()) {
+    found = distributions_.emplace(RowName(day, key), Series()).first;
+  }
+  Series& series = found->second;
+  series.count += std::ssize(samples);
+  if (!selection.hasValues) return Done{};
+  if (::write(copied_.get(), samples.data(), samples.size_bytes()) !=
+      static_cast<ssize_t>(samples.size_bytes())) {
+    return systemError("copy", "segments");
+  }
+  series.blocks.push_back({copies_, samples.size()});
+  copies_ += samples.size();
+  ++blocks_;
+  return Done{};
+}
+
+std::size_t WaitingValues::readSeries(const Series& series, std::uint64_t at,
+                                      std::span<DistributionSample> into) const {
+  for (const Series::Block& block : series.blocks) {
+    if (at >= block.count) {
+      at -= block.count;
+      continue;
+    }
+    const std::span<DistributionSample> part =
+        into.first(std::min<std::uint64_t>(block.count - at, into.size()));
+    const auto offset = static_cast<off_t>((block.first + at) * sizeof(DistributionSample));
+    const ssize_t got = pread(copied_.get(), part.data(), part.size_bytes(), offset);
+    return got > 0 ? static_cast<std::size_t>(got) / sizeof(DistributionSample) : 0;
+  }
+  return 0;
+}
+
+}  // namespace tavrel

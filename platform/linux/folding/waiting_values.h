@@ -1,0 +1,78 @@
+// What programs recorded and no fold has taken yet, for who looks at the store. Reading changes
+// nothing in the segments.
+#pragma once
+
+#include <cstdint>
+#include <span>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/files/descriptor.h"
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/scalar_changes.h"
+#include "platform/linux/folding/segment_folder.h"
+#include "platform/linux/folding/segment_intake.h"
+#include "platform/linux/store/sqlite_history.h"
+
+namespace tavrel {
+
+/// Which rows are wanted.
+struct RowSelection {
+  std::string key;
+  bool isPrefix = true;  // of the keys; otherwise the one key
+  std::int32_t firstDay = 0;
+  std::int32_t lastDay = 0;  // included
+  bool hasValues = true;     // whether measurements are wanted, or only how many there are
+
+  bool contains(std::int32_t day, std::string_view name) const {
+    return day >= firstDay && day <= lastDay && (isPrefix ? name.starts_with(key) : name == key);
+  }
+};
+
+class WaitingValues {
+ public:
+  /// The measurements of one row: where they are among the copied ones.
+  struct Series {
+    struct Block {
+      std::uint64_t first;  // number of a measurement
+      std::uint64_t count;
+    };
+    std::vector<Block> blocks;
+    std::int64_t count = 0;
+  };
+
+  /// Reads all segments that this user may read, each from where `history` says; without a history
+  /// from its start.
+  static Expected<WaitingValues> read(const SegmentFolder& folder, const Recorders& recorders,
+                                      SqliteHistory* history, const RowSelection& selection);
+
+  const RowMap<ScalarChanges::Change>& scalars() const { return scalars_.rows(); }
+  const RowMap<Series>& distributions() const { return distributions_; }
+  /// Segments that were left out because of a limit.
+  std::uint64_t leftOut() const { return leftOut_; }
+
+  /// Measurements of the row from number `at` on, at most as many as fit; 0 at its end or on
+  /// failure.
+  std::size_t readSeries(const Series& series, std::uint64_t at,
+                         std::span<DistributionSample> into) const;
+
+ private:
+  WaitingValues() = default;
+  Status add(const OpenSegment& segment, const Recorders& recorders, SqliteHistory* history,
+             const RowSelection& selection, FoldedRows& rows);
+  Status addSeries(const RowSelection& selection, std::int32_t day, std::string_view key,
+                   std::span<const DistributionSample> samples);
+
+  ScalarChanges scalars_;
+  RowMap<Series> distributions_;
+  std::uint64_t leftOut_ = 0;
+  // Measurements in the order of segments, in memory of the kernel that is not mapped.
+  Descriptor copied_;
+  std::uint64_t copies_ = 0;
+  std::size_t blocks_ = 0;
+};
+
+}  // namespace tavrel

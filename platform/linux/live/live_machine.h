@@ -1,0 +1,44 @@
+// All live services of the machine: what its kernel tells, as drivers that publish channels.
+//
+// The files are those below the device root. A root other than "/" shows live services only when it
+// has a folder /proc of its own, and then what that and its folder /sys hold; links to the
+// machine's own folders serve. A root with /sys alone only stands in for a few facts of the
+// hardware. The services are found out on the first request; devices that come later appear in the
+// next process.
+#pragma once
+
+#include <memory>
+
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/recorded/live_services.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class LiveMachine final : public LiveServices {
+ public:
+  struct Options {
+    int oneSensorMilliseconds;
+    int allSensorsMilliseconds;
+  };
+
+  /// The root and the log must outlive it and its samplings.
+  LiveMachine(const DeviceRoot& root, SystemLog& log);
+  LiveMachine(const DeviceRoot& root, SystemLog& log, const Options& options);
+  ~LiveMachine() override;
+
+  plist::Array services() override;
+  std::unique_ptr<LiveSampling> subscribe() override;
+
+ private:
+  class State;
+  class Sampling;
+  State& state();
+
+  const DeviceRoot& root_;
+  SystemLog& log_;
+  const Options options_;
+  std::shared_ptr<State> state_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,187 @@
+// One facility of the kernel: the channels that it publishes and the files that hold their values.
+//
+// Values are kept in slots. A file fills a range of slots; a channel shows one slot, an array of
+// them, or for each state of a residency two: first the entries of all states, then their
+// residencies. What a reading does not give is `kUnset`, and its channel is absent.
+//
+//   LiveSource source("LinuxSwap", "swap");
+//   const std::uint32_t slot = source.addNumberFile(path, {.multiply = 1024});
+//   source.addSimple({"Swap", "", kBytes}, "swap.used", slot);
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <span>
+#include <string>
+#include <string_view>
+#include <unordered_set>
+#include <vector>
+
+#include "base/plist.h"
+#include "platform/linux/live/kernel_file.h"
+#include "platform/linux/live/kernel_text.h"
+#include "platform/linux/live/live_units.h"
+
+namespace tavrel::live {
+
+inline constexpr std::uint16_t kToolCategory = 0x0001;
+inline constexpr std::uint16_t kDailyCategory = 0x0100;
+
+/// The formats of channels, by their number in a legend.
+enum class ChannelFormat : std::uint8_t { Simple = 1, State = 2, SimpleArray = 4 };
+
+/// Where a channel is filed, and its unit.
+struct Place {
+  std::string_view group;
+  std::string_view subGroup;
+  Unit unit;
+};
+
+struct LiveChannel {
+  std::string name;
+  std::uint64_t id;
+  ChannelFormat format;
+  std::uint16_t categories;
+  std::uint16_t elements;
+  std::uint32_t firstSlot;
+  std::uint32_t slots;
+  std::int32_t states = -1;  // of a residency: its entry in `LiveSource::residency`
+
+  /// As it stands in legends and elements.
+  std::uint64_t type() const {
+    return static_cast<std::uint64_t>(format) | std::uint64_t{categories} << 16 |
+           std::uint64_t{elements} << 32;
+  }
+};
+
+/// The states of a residency.
+struct Residency {
+  std::vector<std::uint64_t> ids;
+  std::vector<std::int64_t> numbers;       // by which the kernel calls them; empty when it does not
+  std::uint32_t currentSlot = UINT32_MAX;  // holds the number of the current one
+};
+
+/// What the text of a file means.
+class TextReader {
+ public:
+  virtual ~TextReader() = default;
+  /// Fills `slots`, which are all `kUnset`, as far as the text goes.
+  virtual void read(std::string_view text, std::span<std::int64_t> slots) const = 0;
+};
+
+/// How a file may be read.
+enum class Speed : std::uint8_t {
+  Quick,
+  Slow,  // the device behind it may take its time: read last, and only for a bounded time
+};
+
+struct LiveFile {
+  KernelFile file;
+  std::uint32_t firstSlot;
+  std::uint32_t slots;
+  Scale scale;  // of the file's one number, without a reader
+  std::unique_ptr<const TextReader> reader;
+  Speed speed = Speed::Quick;
+  std::vector<std::string> powerStatus = {};  // files that say "suspended" while it may not be read
+};
+
+class LiveSource {
+ public:
+  LiveSource(std::string_view className, std::string_view name)
+      : className_(className), name_(name) {}
+
+  // -- What it shows, told by whoever builds it --------------------------------------------------
+
+  /// A file of one number. The slot is the result, here and below.
+  std::uint32_t addNumberFile(std::string path, Scale scale = {}, Speed speed = Speed::Quick,
+                              std::vector<std::string> powerStatus = {});
+  /// A file whose text the reader takes apart into so many slots.
+  std::uint32_t addTextFile(std::string path, std::uint32_t slots,
+                            std::unique_ptr<const TextReader> reader, ReadMode mode);
+  /// A value that a file system or the process itself tells.
+  std::uint32_t addMeasured(std::uint32_t slots,
+                            std::function<void(std::span<std::int64_t>)> measure);
+
+  void addSimple(const Place& place, std::string name, std::uint32_t slot,
+                 std::uint16_t categories = kToolCategory);
+  void addArray(const Place& place, std::string name, std::uint32_t firstSlot, std::uint32_t slots);
+  /// `firstSlot` begins the entries of the states.
+  void addStates(const Place& place, std::string name, std::uint32_t firstSlot,
+                 Residency residency);
+
+  enum class Fold : std::uint8_t { Sum, Largest };
+  /// A daily figure made of all slots that were added under its name.
+  void addToFold(std::string_view name, Unit unit, Fold fold, std::uint32_t slot);
+  /// A line for the system log about what is not shown.
+  void note(std::string line) { notes_.push_back(std::move(line)); }
+  const std::vector<std::string>& notes() const { return notes_; }
+  /// Publishes the folds, in the order in which they were begun. To be called last.
+  void publishFolds();
+
+  // -- For whoever samples -----------------------------------------------------------------------
+
+  const std::string& className() const { return className_; }
+  const std::string& name() const { return name_; }
+  std::uint64_t driverID() const { return stableID(className_ + '/' + name_); }
+  bool empty() const { return groups_.empty(); }
+
+  /// The service, as a recording has it.
+  plist::Dictionary service() const;
+  template <class Callback>
+  void forEachChannel(const Callback& callback) const {
+    for (const Group& group : groups_) {
+      for (const LiveChannel& channel : group.channels)
+        callback(channel);
+    }
+  }
+  const Residency& residency(const LiveChannel& channel) const {
+    return residencies_[static_cast<std::size_t>(channel.states)];
+  }
+  std::vector<LiveFile>& files() { return files_; }
+  /// Marks the files that the channel needs in `wanted`, which has one flag for each.
+  void want(const LiveChannel& channel, std::vector<bool>& wanted) const;
+  /// Takes over the text of a file; nothing when it could not be read.
+  void takeText(std::size_t file, std::optional<std::string_view> text);
+  /// What remains after all wanted files are read.
+  void finish();
+  std::span<const std::int64_t> slots() const { return slots_; }
+
+ private:
+  struct Group {
+    std::string group;
+    std::string subGroup;
+    Unit unit;
+    std::vector<LiveChannel> channels;
+  };
+  struct FoldedSlots {
+    std::string name;
+    Unit unit;
+    Fold fold;
+    std::vector<std::uint32_t> of;
+    std::uint32_t slot = 0;
+  };
+  struct Measured {
+    std::uint32_t firstSlot;
+    std::uint32_t slots;
+    std::function<void(std::span<std::int64_t>)> measure;
+  };
+
+  std::uint32_t addSlots(std::uint32_t count);
+  void add(const Place& place, LiveChannel channel);
+  void wantSlots(std::uint32_t first, std::uint32_t count, std::vector<bool>& wanted) const;
+  std::int64_t folded(const FoldedSlots& fold) const;
+
+  std::string className_;
+  std::string name_;
+  std::vector<Group> groups_;
+  std::vector<Residency> residencies_;
+  std::vector<LiveFile> files_;  // by ascending slots
+  std::vector<Measured> measured_;
+  std::vector<FoldedSlots> folds_;
+  std::vector<std::int64_t> slots_;
+  std::unordered_set<std::uint64_t> ids_;
+  std::vector<std::string> notes_;
+};
+
+}  // namespace tavrel::live

@@ -1,0 +1,164 @@
+// Sources of residencies: how long a device was in each of its states, and how often it entered
+// them.
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "base/limits.h"
+#include "platform/linux/live/attribute_class.h"
+#include "platform/linux/live/sources.h"
+#include "platform/linux/live/text_table.h"
+
+namespace tavrel::live {
+namespace {
+
+constexpr std::string_view kProcessors = "/sys/devices/system/cpu";
+constexpr Scale kTicks{10, 1};  // of 10 ms
+
+std::string lineOf(const std::string& path) {
+  TextBuffer buffer;
+  auto text = readKernelFile(path, ReadMode::Once, buffer);
+  return text ? std::string(takeLine(*text)) : std::string();
+}
+
+// The keys of the rows that begin with a number, in their order.
+std::vector<std::string> numberedRows(const std::string& path, const TableForm& form) {
+  TextBuffer buffer;
+  auto text = readKernelFile(path, ReadMode::Once, buffer);
+  std::vector<std::string> keys;
+  while (text && !text->empty() && keys.size() < limits::kLiveElements) {
+    std::string_view line = takeLine(*text);
+    const std::string_view key = keyOfLine(line, form);
+    if (parseNumber(key)) keys.emplace_back(key);
+  }
+  return keys;
+}
+
+// A table "FROM: ENTRIES OF STATE 0, OF STATE 1 ..." whose rows add up to the entries of states.
+std::unique_ptr<TableReader> transitionReader(const std::vector<std::string>& states,
+                                              const TableForm& form) {
+  std::vector<Cell> cells;
+  for (std::size_t i = 0; i < states.size(); ++i)
+    cells.push_back({i + 1, static_cast<std::uint32_t>(i)});
+  auto reader = std::make_unique<TableReader>(form, std::move(cells));
+  for (const std::string& state : states)
+    reader->addRow(state, 0);
+  return reader;
+}
+
+std::unique_ptr<TableReader> timeReader(const std::vector<std::string>& states,
+                                        const TableForm& form, std::size_t token, Scale scale) {
+  auto reader = std::make_unique<TableReader>(form, std::vector<Cell>{{token, 0, scale}});
+  for (std::size_t i = 0; i < states.size(); ++i)
+    reader->addRow(states[i], static_cast<std::uint32_t>(i));
+  return reader;
+}
+
+// A device with a text of times, one of transitions, and a file that tells the current state.
+struct StateTable {
+  std::string times;
+  std::string transitions;
+  std::string current;
+  Speed currentSpeed;
+  TableForm form;
+  bool timeIsLast;  // behind the transitions in their own row, rather than behind the state
+  Scale scale;
+  std::string (*nameOf)(std::int64_t number);
+};
+
+void addStateTable(const StateTable& table, const Place& place, const std::string& name,
+                   LiveSource& source) {
+  const std::vector<std::string> states = numberedRows(table.times, table.form);
+  if (states.empty()) return;
+  Residency residency;
+  std::vector<std::string> names;
+  for (const std::string& state : states) {
+    residency.numbers.push_back(*parseNumber(state));
+    names.push_back(table.nameOf(residency.numbers.back()));
+  }
+  residency.ids = stateIDs(names);
+  const auto count = static_cast<std::uint32_t>(states.size());
+  const std::uint32_t first = source.addTextFile(
+      table.transitions, count, transitionReader(states, table.form), ReadMode::Once);
+  source.addTextFile(
+      table.times, count,
+      timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale),
+      ReadMode::Once);
+  residency.currentSlot = source.addNumberFile(table.current, {}, table.currentSpeed);
+  source.addStates(place, name, first, std::move(residency));
+}
+
+}  // namespace
+
+void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
+  for (const NamedDevice& cpu : devicesIn(root, kProcessors, "cpu", "", false, source)) {
+    const std::string folder = cpu.path + "/cpuidle/state";
+    std::vector<std::string> names;
+    for (std::size_t i = 0; i < limits::kLiveElements; ++i) {
+      std::string name = lineOf(folder + std::to_string(i) + "/name");
+      if (name.empty()) break;
+      names.push_back(std::move(name));
+    }
+    if (names.empty()) continue;
+    std::uint32_t first = UINT32_MAX;
+    for (const char* const file : {"/usage", "/time"}) {
+      for (std::size_t i = 0; i < names.size(); ++i)
+        first = std::min(first, source.addNumberFile(folder + std::to_string(i) + file));
+    }
+    source.addStates({"CPU Idle", cpu.name, kMicroseconds}, cpu.name + ".idle_states", first,
+                     {.ids = stateIDs(names), .numbers = {}});
+  }
+}
+
+void addCpuFrequency(const DeviceRoot& root, LiveSource& source) {
+  const std::string folder = std::string(kProcessors) + "/cpufreq";
+  for (const NamedDevice& policy : devicesIn(root, folder, "policy", "", false, source)) {
+    addStateTable({.times = policy.path + "/stats/time_in_state",
+                   .transitions = policy.path + "/stats/trans_table",
+                   .current = policy.path + "/scaling_cur_freq",
+                   .currentSpeed = Speed::Quick,
+                   .form = {},
+                   .timeIsLast = false,
+                   .scale = kTicks,
+                   .nameOf = frequencyName},
+                  {"CPU Frequency", policy.name, kMilliseconds}, policy.name + ".frequency",
+                  source);
+    const std::string total = policy.path + "/stats/total_trans";
+    if (!exists(total)) continue;
+    source.addSimple({"CPU Frequency", policy.name, kEvents}, policy.name + ".frequency_changes",
+                     source.addNumberFile(total));
+  }
+}
+
+void addDeviceFrequency(const DeviceRoot& root, LiveSource& source) {
+  for (const NamedDevice& device : devicesIn(root, "/sys/class/devfreq", "", "", false, source)) {
+    addStateTable({.times = device.path + "/trans_stat",
+                   .transitions = device.path + "/trans_stat",
+                   .current = device.path + "/cur_freq",
+                   .currentSpeed = Speed::Quick,
+                   .form = {.mark = "*"},
+                   .timeIsLast = true,
+                   .scale = {},
+                   .nameOf = [](std::int64_t hertz) { return frequencyName(hertz / 1000); }},
+                  {"Device Frequency", device.name, kMilliseconds}, device.name + ".frequency",
+                  source);
+  }
+}
+
+void addCooling(const DeviceRoot& root, LiveSource& source) {
+  for (const NamedDevice& device :
+       devicesIn(root, "/sys/class/thermal", "cooling_device", "type", false, source)) {
+    const std::string stats = device.path + "/stats/";
+    addStateTable({.times = stats + "time_in_state_ms",
+                   .transitions = stats + "trans_table",
+                   .current = device.path + "/cur_state",
+                   .currentSpeed = Speed::Slow,
+                   .form = {.mark = "state"},
+                   .timeIsLast = false,
+                   .scale = {},
+                   .nameOf = [](std::int64_t state) { return "state" + std::to_string(state); }},
+                  {"Cooling", device.name, kMilliseconds}, device.name + ".cooling_states", source);
+  }
+}
+
+}  // namespace tavrel::live

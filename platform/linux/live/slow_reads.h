@@ -1,0 +1,54 @@
+// Reading files behind which a device may keep the reader waiting.
+//
+// A thread reads them one after another. When one of them does not answer in time, another thread
+// goes on with the rest, and the reading ends without it. A file that is still being waited for at
+// the next reading is left out of that, too.
+#pragma once
+
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "platform/linux/live/kernel_file.h"
+#include "platform/system_log.h"
+
+namespace tavrel::live {
+
+/// A file that one thread at a time reads. It outlives its owner while a thread waits for it.
+struct SlowFile {
+  SlowFile(std::string filePath, bool mayStayOpen)
+      : path(std::move(filePath)), staysOpen(mayStayOpen) {}
+
+  const std::string path;
+  const bool staysOpen;
+  Descriptor descriptor = {};
+  bool isWaitedFor = false;  // guarded by the reading's mutex
+};
+
+struct Patience {
+  int oneMilliseconds;
+  int allMilliseconds;
+};
+
+class SlowReads {
+ public:
+  SlowReads(SystemLog& log, Patience patience);
+
+  /// The texts of all files, in their order; nothing for those that failed or did not answer. A
+  /// line names the latter.
+  std::vector<std::optional<std::string>> read(std::vector<std::shared_ptr<SlowFile>> files);
+
+ private:
+  struct Round;
+  static void work(const std::shared_ptr<Round>& round);
+  bool startThread(const std::shared_ptr<Round>& round);
+
+  SystemLog& log_;
+  const Patience patience_;
+  // Of all readings: a file may still belong to a thread of an earlier one.
+  const std::shared_ptr<std::mutex> mutex_;
+};
+
+}  // namespace tavrel::live

@@ -1,0 +1,41 @@
+// The table that remembers how far each segment of the store's clients was folded. It is changed in
+// the transaction that takes a segment's values, so that each of them is taken once.
+#pragma once
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <optional>
+#include <span>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/linux/store/sqlite_connection.h"
+
+namespace tavrel {
+
+using SegmentIdentity = std::span<const std::byte, 16>;
+
+/// A segment that the store remembers: the user who owns its file, and its random identity.
+struct SegmentName {
+  std::uint32_t owner = 0;
+  std::array<std::byte, 16> identity{};
+  bool operator==(const SegmentName&) const = default;
+};
+
+/// The operations throw `StoreFailure`. Version 1 of the schema has no such table.
+namespace segment_table {
+
+std::optional<std::string> position(SqliteConnection& connection, std::uint32_t owner,
+                                    SegmentIdentity identity);
+/// By owner, then by identity.
+std::vector<SegmentName> names(SqliteConnection& connection);
+/// Inside a transaction.
+void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity,
+                 std::string_view position);
+void removePosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity);
+
+}  // namespace segment_table
+
+}  // namespace tavrel

@@ -1,0 +1,147 @@
+// tavrel-statsd: records what programs send as StatsD datagrams.
+#include <charconv>
+#include <cstdio>
+#include <getopt.h>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/format.h"
+#include "base/version.h"
+#include "statsd/statsd_recorder.h"
+#include "statsd/statsd_sockets.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::uint16_t kPort = 8125;
+constexpr std::uint32_t kLongestIdle = 86'400;  // seconds
+
+constexpr const char* kHelp =
+    "Usage: tavrel-statsd [OPTIONS]\n"
+    "Records counters, gauges, timers and histograms that programs send as StatsD datagrams.\n"
+    "\n"
+    "  --udp PORT      listen at 127.0.0.1:PORT (default 8125 when no socket is given)\n"
+    "  --unix PATH     listen at a Unix datagram socket\n"
+    "  --prefix TEXT   begin each key with TEXT (default \"statsd.\")\n"
+    "  --idle SECONDS  end after so long without a datagram; 0 is never (default 60)\n"
+    "  --help, --version\n"
+    "\n"
+    "Sockets of the service manager take the place of --udp and --unix. See tavrel-statsd(8).\n";
+
+struct Options {
+  std::vector<std::uint16_t> ports;
+  std::vector<std::string> paths;
+  std::string prefix = "statsd.";
+  std::uint32_t idleSeconds = 60;
+};
+
+void complain(std::string_view message) {
+  std::fprintf(stderr, "tavrel-statsd: %s\n", std::string(message).c_str());
+}
+
+template <class Number>
+bool parse(std::string_view text, Number most, Number& number) {
+  const auto [stop, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+  return error == std::errc() && stop == text.data() + text.size() && number <= most;
+}
+
+// An exit status when the program is not to run.
+std::optional<int> parseOptions(int argc, char** argv, Options& options) {
+  enum : int { kUdp = 256, kUnix, kPrefix, kIdle, kShowHelp, kVersion };
+  constexpr option kOptions[] = {{"udp", required_argument, nullptr, kUdp},
+                                 {"unix", required_argument, nullptr, kUnix},
+                                 {"prefix", required_argument, nullptr, kPrefix},
+                                 {"idle", required_argument, nullptr, kIdle},
+                                 {"help", no_argument, nullptr, kShowHelp},
+                                 {"version", no_argument, nullptr, kVersion},
+                                 {nullptr, 0, nullptr, 0}};
+  const auto misuse = [](std::string_view message) {
+    complain(message);
+    return 2;
+  };
+  for (int found = 0; (found = getopt_long(argc, argv, "h", kOptions, nullptr)) != -1;) {
+    std::uint16_t port = 0;
+    switch (found) {
+      case kUdp:
+        if (!parse(optarg, std::uint16_t{65535}, port) || port == 0)
+          return misuse(format("not a port: %s: give 1 to 65535", optarg));
+        options.ports.push_back(port);
+        break;
+      case kUnix:
+        options.paths.emplace_back(optarg);
+        break;
+      case kPrefix:
+        if (!isStatsdPrefix(optarg))
+          return misuse(
+              format("not a prefix: %s: give letters, digits, '.', '_' and '-', at most "
+                     "200",
+                     optarg));
+        options.prefix = optarg;
+        break;
+      case kIdle:
+        if (!parse(optarg, kLongestIdle, options.idleSeconds))
+          return misuse(format("not a time: %s: give 0 to %u seconds", optarg, kLongestIdle));
+        break;
+      case kVersion:
+        std::printf("tavrel-statsd %s\n", std::string(version()).c_str());
+        return 0;
+      case 'h':
+      case kShowHelp:
+        std::fputs(kHelp, stdout);
+        return 0;
+      default:
+        return 2;
+    }
+  }
+  if (optind < argc) return misuse(format("no argument '%s': see --help", argv[optind]));
+  return std::nullopt;
+}
+
+Expected<std::vector<DatagramSocket>> openSockets(const Options& options) {
+  auto sockets = activatedDatagramSockets();
+  if (!sockets || !sockets->empty()) return sockets;
+  std::vector<std::uint16_t> ports = options.ports;
+  if (ports.empty() && options.paths.empty()) ports.push_back(kPort);
+  const auto keep = [&](Expected<DatagramSocket> made) -> Status {
+    if (!made) return made.error();
+    sockets->push_back(std::move(*made));
+    return Done{};
+  };
+  for (const std::uint16_t port : ports)
+    if (Status kept = keep(openLoopbackSocket(port)); !kept) return kept.error();
+  for (const std::string& path : options.paths)
+    if (Status kept = keep(openUnixSocket(path)); !kept) return kept.error();
+  return sockets;
+}
+
+int run(int argc, char** argv) {
+  Options options;
+  if (const auto status = parseOptions(argc, argv, options)) return *status;
+  const auto sockets = openSockets(options);
+  if (!sockets) {
+    complain(sockets.error().message);
+    return 1;
+  }
+  StatsdRecorder recorder(options.prefix);
+  // Datagrams are taken anyway: the library tries again while the program runs.
+  const char* why = nullptr;
+  if (BHClientGetStatus(&why) != BHClientStatusRecording) complain(why);
+
+  std::optional<std::chrono::milliseconds> idle;
+  if (options.idleSeconds > 0) idle = std::chrono::seconds(options.idleSeconds);
+  const Status received =
+      receiveDatagrams(*sockets, idle,
+                       {.take = [&](std::string_view datagram) { recorder.take(datagram); },
+                        .dropTooLong = [&] { recorder.count(StatsdFault::TooLong); }});
+  if (received) return 0;
+  complain(received.error().message);
+  return 1;
+}
+
+}  // namespace
+}  // namespace tavrel
+
+int main(int argc, char** argv) {
+  return tavrel::run(argc, argv);
+}

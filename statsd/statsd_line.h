@@ -1,0 +1,39 @@
+// Lines of the StatsD protocol: NAME:VALUE|TYPE, then fields that begin with "|".
+//
+//   StatsdLine line;
+//   if (parseStatsdLine("requests:1|c|@0.1", line) == StatsdParse::Good) use(line);
+#pragma once
+
+#include <cstdint>
+#include <string_view>
+#include <vector>
+
+namespace tavrel {
+
+enum class StatsdKind : std::uint8_t {
+  Counter,     // c
+  Gauge,       // g with a plain number
+  GaugeDelta,  // g with a sign
+  Series,      // ms, h, d
+};
+
+enum class StatsdParse : std::uint8_t {
+  Good,
+  Malformed,
+  Unsupported,  // a set, an event or a service check
+};
+
+struct StatsdLine {
+  /// Not empty; without tags. Refers to the line that was parsed.
+  std::string_view name;
+  StatsdKind kind;
+  /// One or more, all finite. Gauges have one.
+  std::vector<double> values;
+  /// The part of all events that was sent, above 0 and up to 1.
+  double rate;
+};
+
+/// Parses one line without its end. `result` has a meaning only when the outcome is good.
+StatsdParse parseStatsdLine(std::string_view text, StatsdLine& result);
+
+}  // namespace tavrel

@@ -1,0 +1,126 @@
+#include "statsd/statsd_recorder.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "base/arithmetic.h"
+#include "client/segment_format.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kLongestPrefix = 200;
+
+// How often a sampled measurement is recorded at most. A sender must not fill the segment with one
+// line; no client samples more thinly.
+constexpr double kMostCopies = 1000;
+
+constexpr const char* kFaultNames[] = {"malformed", "unsupported", "refused", "too_long"};
+
+constexpr bool isKeyCharacter(char character) {
+  return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
+         (character >= '0' && character <= '9') || character == '.' || character == '_' ||
+         character == '-';
+}
+
+// The whole part of `value`; the rest waits in `remainder`. What lies a rounding error below a
+// whole number, as ten times a tenth may, counts as that number.
+std::int64_t takeWhole(double value, double& remainder) {
+  constexpr double kRoundingError = 1e-9;
+  const double sum = value + remainder;
+  const double whole = std::floor(sum + kRoundingError);
+  remainder = std::isfinite(sum) ? sum - whole : 0;
+  return saturatingInt64(whole);
+}
+
+}  // namespace
+
+void appendStatsdKey(std::string& key, std::string_view name) {
+  for (const char character : name)
+    key += isKeyCharacter(character) ? character : '_';
+}
+
+bool isStatsdPrefix(std::string_view text) {
+  return text.size() <= kLongestPrefix && std::ranges::all_of(text, isKeyCharacter);
+}
+
+StatsdRecorder::StatsdRecorder(std::string prefix)
+    : prefix_(std::move(prefix)), keysLeft_(kBHKeys), nameBytesLeft_(kBHNamesBytes) {
+  for (std::size_t i = 0; i < faults_.size(); ++i) {
+    const std::string key = prefix_ + "tavrel-statsd." + kFaultNames[i];
+    faults_[i] = BHClientScalarForKey(key.c_str());
+    --keysLeft_;
+    nameBytesLeft_ -= key.size();
+  }
+}
+
+void StatsdRecorder::take(std::string_view datagram) {
+  while (!datagram.empty()) {
+    const std::size_t end = std::min(datagram.find('\n'), datagram.size());
+    if (end > 0) takeLine(datagram.substr(0, end));
+    datagram.remove_prefix(std::min(end + 1, datagram.size()));
+  }
+}
+
+void StatsdRecorder::count(StatsdFault fault) const {
+  BHClientScalarAdd(faults_[static_cast<std::size_t>(fault)], 1);
+}
+
+void StatsdRecorder::takeLine(std::string_view text) {
+  switch (parseStatsdLine(text, line_)) {
+    case StatsdParse::Good:
+      if (!record(line_)) count(StatsdFault::Refused);
+      return;
+    case StatsdParse::Malformed:
+      return count(StatsdFault::Malformed);
+    case StatsdParse::Unsupported:
+      return count(StatsdFault::Unsupported);
+  }
+}
+
+bool StatsdRecorder::record(const StatsdLine& line) {
+  Key* const key = find(line.kind == StatsdKind::Series ? series_ : scalars_, line.name);
+  if (key == nullptr) return false;
+  for (const double value : line.values) {
+    switch (line.kind) {
+      case StatsdKind::Counter:
+        BHClientScalarAdd(key->scalar, takeWhole(value / line.rate, key->remainder));
+        break;
+      case StatsdKind::GaugeDelta:
+        BHClientScalarAdd(key->scalar, takeWhole(value, key->remainder));
+        break;
+      case StatsdKind::Gauge:
+        key->remainder = 0;
+        BHClientScalarSet(key->scalar, takeWhole(value, key->remainder));
+        break;
+      case StatsdKind::Series: {
+        const double copies = std::min(1 / line.rate, kMostCopies);
+        for (std::int64_t left = takeWhole(copies, key->remainder); left > 0; --left)
+          BHClientDistributionRecord(key->series, value);
+        break;
+      }
+    }
+  }
+  return true;
+}
+
+// Null when the library would refuse the key.
+StatsdRecorder::Key* StatsdRecorder::find(Keys& keys, std::string_view name) {
+  if (prefix_.size() + name.size() > kBHLongestName) return nullptr;
+  name_.assign(prefix_);
+  appendStatsdKey(name_, name);
+  if (const auto known = keys.find(std::string_view(name_)); known != keys.end())
+    return &known->second;
+  if (keysLeft_ == 0 || nameBytesLeft_ < name_.size()) return nullptr;
+  --keysLeft_;
+  nameBytesLeft_ -= name_.size();
+  Key key;
+  if (&keys == &series_) {
+    key.series = BHClientDistributionForKey(name_.c_str());
+  } else {
+    key.scalar = BHClientScalarForKey(name_.c_str());
+  }
+  return &keys.emplace(name_, key).first->second;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,69 @@
+// Records datagrams of StatsD lines through libbrimhold.
+#pragma once
+
+#include <array>
+#include <brimhold/client.h>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+
+#include "statsd/statsd_line.h"
+
+namespace tavrel {
+
+/// The key of a name: letters, digits, ".", "_" and "-" stay, each other byte becomes "_".
+void appendStatsdKey(std::string& key, std::string_view name);
+
+/// What the program records about itself, under PREFIX "tavrel-statsd.".
+enum class StatsdFault : std::uint8_t {
+  Malformed,    // lines
+  Unsupported,  // lines
+  Refused,      // lines whose key is too long or one too many
+  TooLong,      // datagrams
+};
+
+class StatsdRecorder {
+ public:
+  /// A prefix is text that `isStatsdPrefix` accepts.
+  explicit StatsdRecorder(std::string prefix);
+
+  /// Lines, separated by line ends.
+  void take(std::string_view datagram);
+  /// Counts what was not recorded.
+  void count(StatsdFault fault) const;
+
+ private:
+  struct Key {
+    BHClientScalarKey* scalar = nullptr;
+    BHClientDistributionKey* series = nullptr;
+    double remainder = 0;  // of a scalar: what is below one, or of a series: of its copies
+  };
+  struct Hash {
+    using is_transparent = void;
+    std::size_t operator()(std::string_view text) const {
+      return std::hash<std::string_view>()(text);
+    }
+  };
+  using Keys = std::unordered_map<std::string, Key, Hash, std::equal_to<>>;
+
+  void takeLine(std::string_view text);
+  bool record(const StatsdLine& line);
+  Key* find(Keys& keys, std::string_view name);
+
+  std::string prefix_;
+  std::string name_;  // the key that is looked up
+  StatsdLine line_;
+  Keys scalars_;
+  Keys series_;
+  std::size_t keysLeft_;
+  std::size_t nameBytesLeft_;
+  std::array<BHClientScalarKey*, 4> faults_;
+};
+
+/// Whether keys may begin with the text: letters, digits, ".", "_" and "-", up to 200 bytes.
+bool isStatsdPrefix(std::string_view text);
+
+}  // namespace tavrel

@@ -1,0 +1,190 @@
+#include "statsd/statsd_sockets.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <charconv>
+#include <cstdlib>
+#include <cstring>
+#include <fcntl.h>
+#include <memory>
+#include <netinet/in.h>
+#include <poll.h>
+#include <sys/socket.h>
+#include <sys/stat.h>
+#include <sys/un.h>
+#include <unistd.h>
+
+#include "base/format.h"
+
+namespace tavrel {
+namespace {
+
+constexpr int kFirstDescriptor = 3;
+constexpr int kMostSockets = 16;
+
+// Datagrams per system call.
+constexpr unsigned kBatch = 32;
+
+// Bytes that the kernel keeps while the program is busy or starts. It grants what its limit allows.
+constexpr int kReceiveBuffer = 1 << 20;
+
+std::optional<int> numberFromEnvironment(const char* variable) {
+  const char* const text = std::getenv(variable);
+  if (text == nullptr) return std::nullopt;
+  int number = 0;
+  const char* const end = text + std::strlen(text);
+  const auto [stop, error] = std::from_chars(text, end, number);
+  if (error != std::errc() || stop != end || number <= 0) return std::nullopt;
+  return number;
+}
+
+bool isDatagramSocket(int descriptor) {
+  int type = 0;
+  socklen_t size = sizeof type;
+  return getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 && type == SOCK_DGRAM;
+}
+
+template <class Address>
+bool bindTo(int descriptor, const Address& address) {
+  return bind(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+}
+
+DatagramSocket newSocket(int family) {
+  DatagramSocket made(socket(family, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  setsockopt(made.descriptor(), SOL_SOCKET, SO_RCVBUF, &kReceiveBuffer, sizeof kReceiveBuffer);
+  return made;
+}
+
+// Whether the path is a socket that refuses connections: its program has ended.
+bool isAbandoned(const sockaddr_un& address) {
+  struct stat status {};
+  if (lstat(address.sun_path, &status) != 0 || !S_ISSOCK(status.st_mode)) return false;
+  const DatagramSocket probe = newSocket(AF_UNIX);
+  return connect(probe.descriptor(), reinterpret_cast<const sockaddr*>(&address), sizeof address) !=
+             0 &&
+         errno == ECONNREFUSED;
+}
+
+// Room for a batch, where the kernel writes.
+class Batch {
+ public:
+  Batch() : bytes_(new char[kBatch][kLongestDatagram]) {
+    for (unsigned i = 0; i < kBatch; ++i) {
+      parts_[i] = {.iov_base = bytes_[i], .iov_len = kLongestDatagram};
+      messages_[i] = {};
+      messages_[i].msg_hdr.msg_iov = &parts_[i];
+      messages_[i].msg_hdr.msg_iovlen = 1;
+    }
+  }
+
+  // The number of datagrams; 0 when none waits, -1 with errno.
+  int receive(int descriptor) {
+    int count = 0;
+    do {
+      count = recvmmsg(descriptor, messages_.data(), kBatch, MSG_DONTWAIT, nullptr);
+    } while (count < 0 && errno == EINTR);
+    return count < 0 && errno == EAGAIN ? 0 : count;
+  }
+
+  void hand(int count, const DatagramHandlers& handlers) const {
+    for (unsigned i = 0; i < static_cast<unsigned>(count); ++i) {
+      if ((messages_[i].msg_hdr.msg_flags & MSG_TRUNC) != 0) {
+        handlers.dropTooLong();
+      } else {
+        handlers.take({bytes_[i], messages_[i].msg_len});
+      }
+    }
+  }
+
+ private:
+  std::unique_ptr<char[][kLongestDatagram]> bytes_;
+  std::array<iovec, kBatch> parts_;
+  std::array<mmsghdr, kBatch> messages_;
+};
+
+Error failure(const char* what) {
+  return Error{format("%s: %s", what, std::strerror(errno))};
+}
+
+}  // namespace
+
+DatagramSocket::~DatagramSocket() {
+  if (descriptor_ >= 0) close(descriptor_);
+}
+
+Expected<std::vector<DatagramSocket>> activatedDatagramSockets() {
+  std::vector<DatagramSocket> sockets;
+  const auto process = numberFromEnvironment("LISTEN_PID");
+  const auto count = numberFromEnvironment("LISTEN_FDS");
+  if (!process || *process != getpid() || !count) return sockets;
+  if (*count > kMostSockets) {
+    return Error{format("LISTEN_FDS hands over %d sockets: at most %d", *count, kMostSockets)};
+  }
+  for (int descriptor = kFirstDescriptor; descriptor < kFirstDescriptor + *count; ++descriptor) {
+    if (!isDatagramSocket(descriptor)) {
+      return Error{
+          format("descriptor %d of LISTEN_FDS is no datagram socket: use "
+                 "ListenDatagram= in the socket unit",
+                 descriptor)};
+    }
+    fcntl(descriptor, F_SETFD, FD_CLOEXEC);
+    sockets.emplace_back(descriptor);
+  }
+  return sockets;
+}
+
+Expected<DatagramSocket> openLoopbackSocket(std::uint16_t port) {
+  DatagramSocket made = newSocket(AF_INET);
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_port = htons(port);
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  if (!bindTo(made.descriptor(), address)) {
+    return failure(format("cannot listen at UDP port %u", unsigned{port}).c_str());
+  }
+  return made;
+}
+
+Expected<DatagramSocket> openUnixSocket(const std::string& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  if (path.empty() || path.size() >= sizeof address.sun_path) {
+    return Error{format("cannot listen at %s: give a path of at most %zu bytes", path,
+                        sizeof address.sun_path - 1)};
+  }
+  path.copy(address.sun_path, path.size());
+  DatagramSocket made = newSocket(AF_UNIX);
+  bool isBound = bindTo(made.descriptor(), address);
+  if (!isBound && errno == EADDRINUSE && isAbandoned(address)) {
+    unlink(address.sun_path);
+    isBound = bindTo(made.descriptor(), address);
+  }
+  if (!isBound) return failure(format("cannot listen at %s", path).c_str());
+  chmod(address.sun_path, 0666);
+  return made;
+}
+
+Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
+                        std::optional<std::chrono::milliseconds> idle,
+                        const DatagramHandlers& handlers) {
+  std::vector<pollfd> waiting;
+  for (const DatagramSocket& socket : sockets)
+    waiting.push_back({.fd = socket.descriptor(), .events = POLLIN, .revents = 0});
+  Batch batch;
+  const int patience = idle ? static_cast<int>(idle->count()) : -1;
+  for (;;) {
+    const int ready = poll(waiting.data(), waiting.size(), patience);
+    if (ready == 0) return Done{};
+    if (ready < 0 && errno != EINTR) return failure("cannot wait for datagrams");
+    if (ready < 0) continue;
+    for (const pollfd& socket : waiting) {
+      if (socket.revents == 0) continue;
+      const int count = batch.receive(socket.fd);
+      if (count < 0) return failure("cannot receive datagrams");
+      batch.hand(count, handlers);
+    }
+  }
+}
+
+}  // namespace tavrel

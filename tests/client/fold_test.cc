@@ -1,0 +1,460 @@
+// Folds of real segments into a real store.
+
+#include <algorithm>
+#include <cstdlib>
+#include <fstream>
+#include <random>
+#include <sys/mount.h>
+#include <sys/stat.h>
+#include <sys/vfs.h>
+#include <thread>
+
+#include "platform/linux/folding/recorded_history.h"
+#include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
+#include "recording.h"
+#include "tests/system/killed_process.h"
+
+namespace tavrel {
+namespace {
+
+using Lines = std::vector<std::string>;
+
+int fromEnvironment(const char* name, int otherwise) {
+  const char* const text = std::getenv(name);  // for long runs by hand
+  return text ? std::atoi(text) : otherwise;
+}
+
+class FoldTest : public Recording {
+ protected:
+  struct KeptLog final : SystemLog {
+    void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
+    Lines lines;
+  };
+
+  FoldTest() {
+    chmod(root.c_str(), 0755);
+    chmod(folder.c_str(), 01777);
+  }
+
+  FoldReport foldNow() {
+    log.lines.clear();
+    LinuxPlatform device(DeviceRoot(root), {.log = &log});
+    SqliteStore impatient(device.root(), device.platform().clock, device.platform().preferences,
+                          log, 20);
+    return SegmentFold(device.root(), impatient, device.fileSystem(),
+                       device.platform().propertyLists, log)
+        .run();
+  }
+  /// What the store holds, and what waits too if wanted.
+  void look(bool alsoWaiting = false) {
+    scalars.clear();
+    records.clear();
+    KeptLog own;
+    LinuxPlatform device(DeviceRoot(root), {.log = &own});
+    const DeviceRoot place(alsoWaiting ? root.string() : "/nowhere");
+    auto history = RecordedHistory::open(place, device.store(), Recorders(),
+                                         {.key = "", .firstDay = INT32_MIN, .lastDay = INT32_MAX});
+    ASSERT_TRUE(history) << history.error().message;
+    ASSERT_TRUE(history->walkScalars([&](auto key, auto day, auto value, bool&) {
+      EXPECT_TRUE(scalars.emplace(std::pair(key, day), value).second) << key;
+    }));
+    ASSERT_TRUE(history->walkDistributions([&](auto key, auto, auto count, auto& values, bool&) {
+      double value = 0;
+      std::uint32_t second = 0;
+      auto& row = records[std::string(key)];
+      const std::size_t before = row.size();
+      while (values.getNextValue(value, second))
+        row.push_back(value);
+      EXPECT_EQ(row.size() - before, static_cast<std::size_t>(count)) << key;
+    }));
+  }
+  std::int64_t figure(const char* name) {
+    const std::string key = std::string("com.norvane.brimhold.") + name;
+    std::int64_t sum = 0;  // under the day of the machine's clock
+    for (const auto& [row, value] : scalars)
+      if (row.first == key) sum += value;
+    return sum;
+  }
+  /// All numbers from 0 up.
+  void expectEachOnce(std::size_t count) {
+    auto& values = records["series"];
+    std::sort(values.begin(), values.end());
+    ASSERT_EQ(values.size(), count);
+    std::size_t wrong = 0;
+    for (std::size_t i = 0; i < count; ++i)
+      if (values[i] != static_cast<double>(i)) ++wrong;
+    ASSERT_EQ(wrong, 0U);
+  }
+  std::filesystem::path store() { return LinuxPlatform(DeviceRoot(root)).store().path(); }
+
+  KeptLog log;
+};
+
+TEST_F(FoldTest, AKillAtAnySystemCallLosesAndRepeatsNothing) {
+  auto& recorded = shared<std::atomic<int>>();
+  const Gate wanted;
+  const pid_t child = start([&] {
+    for (;;) {
+      wanted.wait();
+      add(1);
+      for (int i = 0; i < 30; ++i)
+        record(recorded++);
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  int total = 0;
+  for (std::size_t calls = 0;; ++calls) {
+    SCOPED_TRACE(calls);
+    wanted.open();
+    waitpid(child, nullptr, WUNTRACED);
+    kill(child, SIGCONT);
+    run([&] {
+      add(1);
+      record(recorded++);
+      set(static_cast<std::int64_t>(calls));
+    });
+    total += 2;
+    const bool isKilled = runUntilSystemCall(calls, [&] { foldNow(); });
+    run([&] { EXPECT_FALSE(foldNow().failure) << *foldNow().failure; });
+    look();
+    ASSERT_EQ(scalar("count"), total);
+    ASSERT_EQ(scalar("gauge"), calls);
+    ASSERT_NO_FATAL_FAILURE(expectEachOnce(static_cast<std::size_t>(recorded)));
+    ASSERT_EQ(segments().size(), 1U);
+    if (!isKilled) {
+      EXPECT_GT(calls, 200U);
+      break;
+    }
+  }
+  kill(child, SIGKILL);
+  waitFor(child);
+  EXPECT_EQ(foldNow().removed, 1U);
+}
+
+TEST_F(FoldTest, AKilledProgramLosesAndRepeatsNothing) {
+  auto& progress = shared<std::atomic<int>>();
+  std::mt19937 random(7);
+  for (int round = fromEnvironment("TAVREL_KILL_ROUNDS", 20); round > 0; --round) {
+    SCOPED_TRACE(round);
+    progress = 0;
+    std::filesystem::remove_all(root / "var");
+    const pid_t child = start([&] {
+      for (int i = 0; i < 20'000; ++i) {
+        record(i);
+        add(1);
+        progress.store(i + 1, std::memory_order_release);
+      }
+      pause();
+    });
+    const int until = static_cast<int>(random() % 3000);
+    while (progress < until)
+      sched_yield();
+    if (round % 2 == 0) foldNow();
+    kill(child, SIGKILL);
+    EXPECT_EQ(waitFor(child), SIGKILL);
+    ASSERT_FALSE(foldNow().failure);
+    ASSERT_TRUE(segments().empty());
+    look();
+    const auto& values = records["series"];
+    ASSERT_NO_FATAL_FAILURE(expectEachOnce(values.size()));
+    const std::int64_t done = progress;
+    for (const std::int64_t left : {std::ssize(values), scalar("count")})
+      ASSERT_TRUE(left == done || left == done + 1) << left << " of " << done;
+  }
+}
+
+TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
+  const std::int64_t midnight = (kToday + 1) * 86'400;
+  const std::int64_t days[] = {kToday, kToday + 1, kToday - 400, kToday + 30'000, kToday};
+  const pid_t child = start([&] {
+    for (const std::int64_t day : days) {
+      for (const std::int64_t second : {0, 86'399}) {
+        testClock().realtime = midnight + (day - kToday - 1) * 86'400 + second;
+        add(1);
+        record(static_cast<double>(second));
+      }
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  for (std::size_t i = 0; i < std::size(days); ++i) {
+    waitpid(child, nullptr, WUNTRACED);
+    foldNow();
+    kill(child, SIGCONT);
+  }
+  EXPECT_EQ(waitFor(child), 0);
+  foldNow();
+  look();
+  EXPECT_EQ(scalars, (Scalars{{{"count", kToday - 400}, 2},
+                              {{"count", kToday}, 4},
+                              {{"count", kToday + 1}, 2},
+                              {{"count", kToday + 30'000}, 2}}));
+  EXPECT_EQ(records["series"].size(), 10U);
+}
+
+TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {
+  const int processes = fromEnvironment("TAVREL_FOLD_PROCESSES", 6);
+  const int folds = fromEnvironment("TAVREL_FOLD_FOLDS", 3);
+  constexpr int kThreads = 8, kPerThread = 1000;
+  auto& isOver = shared<std::atomic<bool>>();
+  std::vector<pid_t> recorders, folders;
+  for (int process = 0; process < processes; ++process) {
+    recorders.push_back(start([=] {
+      std::vector<std::thread> threads;
+      for (int thread = 0; thread < kThreads; ++thread)
+        threads.emplace_back([=] {
+          for (int i = 0; i < kPerThread; ++i) {
+            add(1);
+            record((process * kThreads + thread) * kPerThread + i);
+          }
+        });
+      for (std::thread& thread : threads)
+        thread.join();
+    }));
+  }
+  for (int i = 0; i < folds; ++i) {
+    folders.push_back(start([&] {
+      while (!isOver)
+        foldNow();
+    }));
+  }
+  for (const pid_t child : recorders)
+    EXPECT_EQ(waitFor(child), 0);
+  isOver = true;
+  for (const pid_t child : folders)
+    EXPECT_EQ(waitFor(child), 0);
+  EXPECT_FALSE(foldNow().failure);
+  look();
+  EXPECT_EQ(scalar("count"), processes * kThreads * kPerThread);
+  expectEachOnce(static_cast<std::size_t>(processes * kThreads * kPerThread));
+  EXPECT_EQ(figure("dropped"), 0);
+  EXPECT_TRUE(segments().empty());
+}
+
+TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
+  const pid_t child = start([] {
+    for (int round = 0; round < 3; ++round) {
+      for (int i = 0; i < 400; ++i)
+        record(round * 1000 + i);
+      add(10);
+      set(round);
+      BHClientDistributionRecord(BHClientDistributionForKey("a"), round);
+      BHClientScalarAdd(BHClientScalarForKey("z"), round);
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  for (int round = 0; round < 3; ++round) {
+    waitpid(child, nullptr, WUNTRACED);
+    look(true);
+    const auto seen = std::pair(scalars, records);
+    EXPECT_EQ(scalar("count"), 10 * (round + 1));
+    EXPECT_EQ(foldNow().values, 401U);
+    for (const bool alsoWaiting : {false, true}) {
+      look(alsoWaiting);
+      EXPECT_EQ(std::pair(scalars, records), seen);
+    }
+    kill(child, SIGCONT);
+  }
+  EXPECT_EQ(waitFor(child), 0);
+}
+
+TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
+  const Gate later;
+  const pid_t child = start([&] {  // its segment comes first
+    BHClientScalarAdd(BHClientScalarForKey("other"), 1);
+    later.wait();
+    testClock().realtime += 10;
+    set(7);
+  });
+  while (segments().empty())
+    sched_yield();
+  for (const int amount : {100, 200})
+    run([&] { set(amount); });
+  later.open();
+  EXPECT_EQ(waitFor(child), 0);
+  run([] { BHClientScalarAdd(keys().gauge, 1000); });
+  EXPECT_EQ(foldNow().scalars, 5U);
+  look();
+  EXPECT_EQ(scalar("gauge"), 1007);
+  for (const std::int64_t amount : {std::int64_t{1}, INT64_MAX, std::int64_t{2}})
+    run([&] { add(amount); });
+  EXPECT_EQ(foldNow().refused, 1U);
+  look();
+  EXPECT_EQ(scalar("count"), 3);  // the largest amount did not fit behind the first
+}
+
+TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root";
+  std::filesystem::create_directories(root / "etc/tavrel");
+  const auto file = root / "etc/tavrel/recorders.plist";
+  const std::string recorders = R"(<?xml version="1.0" encoding="UTF-8"?><plist version="1.0"><dict>
+<key>12</key><array><string>com.a.</string><string>com.norvane.a.</string><string>com</string></array>
+<key>13</key><array><string>com.a.b.</string></array><key>nobody-here</key><array/>
+<key>14</key><string>com.</string></dict></plist>)";
+  const Lines keys{"com.a.x", "com.a.b.x", "com.norvane.a.x", "com.norvane.b", "com.b", "x"};
+  const std::tuple<std::string, unsigned, uid_t, Lines, std::size_t> cases[] = {
+      {recorders, 0644, 0, keys, 2},
+      {recorders, 0644, 12, {"com.a.x", "com.b", "com.norvane.a.x"}, 3},
+      {recorders, 0644, 13, {"com.a.b.x"}, 3},
+      {recorders, 0644, 15, {"x"}, 3},
+      {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
+      {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
+  };
+  for (const auto& [content, mode, user, allowed, lines] : cases) {
+    SCOPED_TRACE(user);
+    std::ofstream(file) << content;
+    chmod(file.c_str(), mode);
+    std::filesystem::remove_all(root / "var");
+    std::filesystem::remove(root / "run/tavrel/fold.lock");
+    run([&, uid = user] {
+      ASSERT_EQ(setuid(uid), 0);
+      for (const std::string& key : keys) {
+        BHClientScalarAdd(BHClientScalarForKey(key.c_str()), 2);
+        BHClientDistributionRecord(BHClientDistributionForKey(key.c_str()), 2);
+      }
+    });
+    const std::size_t refused = keys.size() - allowed.size();
+    EXPECT_EQ(foldNow().refused, 2 * refused);
+    EXPECT_EQ(log.lines.size(), lines) << testing::PrintToString(log.lines);
+    look();
+    EXPECT_EQ(figure("refused"), 2 * refused);
+    Lines taken;
+    for (const auto& [key, values] : records)
+      taken.push_back(key);
+    Lines expected = allowed;
+    std::sort(expected.begin(), expected.end());
+    EXPECT_EQ(taken, expected);
+    EXPECT_EQ(scalars.size(), allowed.size() + (refused > 0 ? 1 : 0));
+  }
+}
+
+TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
+  run([] { add(1); });
+  const std::string segment = segments().at(0);
+  const auto put = [&](const char* name, std::size_t size) {
+    std::ofstream(folder / name) << std::string(size, 'x');
+  };
+  std::filesystem::copy_file(segment, folder / "z.segment");
+  put("size.segment", 5);
+  put("other", 0);
+  put("linked.segment", 0);
+  std::filesystem::create_hard_link(folder / "linked.segment", root / "elsewhere");
+  std::filesystem::create_symlink("/etc/passwd", folder / "link.segment");
+  mkfifo((folder / "pipe.segment").c_str(), 0666);
+  std::filesystem::create_directory(folder / "folder.segment");
+  std::filesystem::create_directory(folder / "fold-wanted");
+  FoldReport report = foldNow();
+  EXPECT_EQ(report.segmentsRefused, 7U);
+  EXPECT_EQ(report.scalars, 1U);
+  const std::string place = "\" in " + folder.string() + " is refused: ";
+  Lines expected;
+  for (const auto& [name, reason] : std::initializer_list<std::pair<const char*, const char*>>{
+           {"z.segment", "a copy of another segment"},
+           {"size.segment", "not a segment"},
+           {"other", "not the name of a segment"},
+           {"linked.segment", "a file with several names"},
+           {"link.segment", "a symbolic link"},
+           {"pipe.segment", "not a regular file"},
+           {"folder.segment", "not a regular file"}})
+    expected.push_back(std::string("\"") + name + place + reason + "; remove it");
+  std::sort(expected.begin(), expected.end());
+  std::sort(log.lines.begin(), log.lines.end());
+  EXPECT_EQ(log.lines, expected);
+  EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
+  report = foldNow();  // the copy is now alone and folded, as if it had been recorded
+  EXPECT_EQ(report.segmentsRefused, 0U);
+  EXPECT_EQ(log.lines, Lines());
+  look();
+  EXPECT_EQ(figure("segments_refused"), 7);
+}
+
+TEST_F(FoldTest, RandomBytesDoNoHarm) {
+  std::mt19937 random(3);
+  run([] {
+    add(3);
+    record(4);
+  });
+  const auto honest = root / "honest";
+  std::filesystem::copy_file(segments().at(0), honest);
+  for (int i = fromEnvironment("TAVREL_HOSTILE_SEGMENTS", 60); i > 0; --i) {
+    const auto path = folder / (std::to_string(i) + ".segment");
+    std::filesystem::copy_file(honest, path);
+    std::fstream file(path);
+    for (int change = 0; change < 40; ++change) {
+      constexpr int kParts[] = {24, 128, kBHKeyTable, kBHNames, kBHCells, kBHChunks};
+      file.seekp(kParts[random() % 6] + static_cast<int>(random() % 64));
+      const std::uint64_t word = random() % 3 == 0 ? random() : random() % 3 - 1;
+      file.write(reinterpret_cast<const char*>(&word), 1 << random() % 4);
+    }
+    file.close();
+    if (random() % 8 == 0) std::filesystem::resize_file(path, random() % kBHSegmentBytes);
+    if (i % 50 == 0) {
+      EXPECT_FALSE(foldNow().failure);
+    }
+  }
+  EXPECT_FALSE(foldNow().failure);
+  look();
+  EXPECT_GE(scalar("count"), 3);
+}
+
+TEST_F(FoldTest, AStoreThatTakesNothingLetsSegmentsWait) {
+  run([] { add(1); });
+  const std::filesystem::path path = store();
+  std::filesystem::create_directories(path.parent_path());
+  const auto expectWaiting = [&](const char* reason) {
+    SCOPED_TRACE(reason);
+    const FoldReport report = foldNow();
+    ASSERT_TRUE(report.failure);
+    EXPECT_NE(report.failure->find(reason), std::string::npos) << *report.failure;
+    EXPECT_TRUE(report.failure->ends_with("; what programs recorded waits for the next fold"));
+    EXPECT_EQ(report.scalars + report.removed, 0U);
+    EXPECT_EQ(segments().size(), 1U);
+  };
+  std::filesystem::create_directory(path);
+  expectWaiting("is not a regular file");
+  std::filesystem::remove(path);
+  {
+    LinuxPlatform other((DeviceRoot(root)));
+    auto batch = other.store().beginBatch();
+    ASSERT_TRUE((*batch)->segmentNames());
+    expectWaiting("locked");
+  }
+  std::filesystem::remove_all(path.parent_path());
+  std::filesystem::create_directory(path.parent_path());
+  if (mount("test", path.parent_path().c_str(), "tmpfs", 0, "size=16k") == 0) {
+    expectWaiting("space");
+    umount(path.parent_path().c_str());
+  }
+  std::ofstream(path) << std::string(8192, 'x');
+  LinuxPlatform device(DeviceRoot(root), {.log = &log});
+  EXPECT_TRUE(device.platform().statistics->BHClientCheckpoint());
+  EXPECT_EQ(log.lines.size(), 1U) << "the damaged store is set aside";
+  look();
+  EXPECT_EQ(scalar("count"), 1);
+  EXPECT_TRUE(segments().empty());
+}
+
+TEST_F(FoldTest, PositionsGoWithTheirSegments) {
+  const auto held = [&] {
+    LinuxPlatform device((DeviceRoot(root)));
+    return (*(*device.store().beginBatch())->segmentNames()).size();
+  };
+  run([] { add(1); });
+  run([] { add(1); });
+  EXPECT_EQ(foldNow().removed, 2U);
+  EXPECT_EQ(held(), 2U);
+  const pid_t child = start([] {
+    add(1);
+    kill(getpid(), SIGSTOP);
+  });
+  waitpid(child, nullptr, WUNTRACED);
+  foldNow();
+  EXPECT_EQ(held(), 1U);
+  kill(child, SIGKILL);
+  waitFor(child);
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,164 @@
+#include <netinet/in.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+
+#include "recording.h"
+#include "statsd/statsd_recorder.h"
+#include "statsd/statsd_sockets.h"
+
+namespace tavrel {
+namespace {
+
+const std::string kProgram = TAVREL_BUILD "/bin/tavrel-statsd";
+
+sockaddr_un unixAddress(const std::string& path) {
+  sockaddr_un address{};
+  address.sun_family = AF_UNIX;
+  path.copy(address.sun_path, sizeof address.sun_path - 1);
+  return address;
+}
+
+template <class Address>
+void send(int family, const Address& address, const std::vector<std::string>& datagrams) {
+  const Descriptor sender(socket(family, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  const auto* const target = reinterpret_cast<const sockaddr*>(&address);
+  for (const std::string& datagram : datagrams) {
+    ASSERT_EQ(sendto(sender.get(), datagram.data(), datagram.size(), 0, target, sizeof address),
+              std::ssize(datagram));
+  }
+}
+
+class Statsd : public Recording {
+ protected:
+  std::int64_t fault(const std::string& name, const std::string& prefix = "statsd.") {
+    const std::string key = prefix + "tavrel-statsd." + name;
+    for (const auto& [keyAndDay, value] : scalars)
+      if (keyAndDay.first == key) return value;
+    return 0;
+  }
+};
+
+TEST_F(Statsd, RecordsWhatLinesSay) {
+  run([] {
+    StatsdRecorder recorder("s.");
+    recorder.take("hits:1|c\nhits:2|c|@0.1\n\nhits:1:2|c|#tag\n");
+    for (int i = 0; i < 3; ++i)
+      recorder.take("thirds:1|c|@0.3");
+    for (int i = 0; i < 10; ++i)
+      recorder.take("tenths:0.1|c");
+    recorder.take("level:3.9|g\nlevel:7.5|g\nlevel:+0.75|g\nlevel:-2|g");
+    recorder.take("time:3.5|ms\ntime:4|h|@0.5\ntime:5|d|@0.00001");
+    recorder.take("time:9|c");  // a scalar may have the name of a series
+    recorder.take("bad\nset:1|s\n" + std::string(1023, 'n') + ":1|c");
+    recorder.count(StatsdFault::TooLong);
+  });
+  fold();
+  const Scalars expected{{{"s.hits", kToday}, 24},
+                         {{"s.thirds", kToday}, 10},
+                         {{"s.tenths", kToday}, 1},
+                         {{"s.level", kToday}, 6},
+                         {{"s.time", kToday}, 9},
+                         {{"s.tavrel-statsd.malformed", kToday}, 1},
+                         {{"s.tavrel-statsd.unsupported", kToday}, 1},
+                         {{"s.tavrel-statsd.refused", kToday}, 1},
+                         {{"s.tavrel-statsd.too_long", kToday}, 1}};
+  EXPECT_EQ(scalars, expected);
+  std::vector<double> times{3.5, 4, 4};
+  times.insert(times.end(), 1000, 5);
+  EXPECT_EQ(records["s.time"], times);
+}
+
+TEST_F(Statsd, CountsLinesOfKeysBeyondTheLimits) {
+  run([] {
+    StatsdRecorder recorder("");
+    for (int round = 0; round < 2; ++round)
+      for (int i = 0; i < kBHKeys; ++i)
+        recorder.take(std::to_string(i) + ":1|c");
+  });
+  run([] {
+    StatsdRecorder recorder("");
+    for (int i = 1000; i < 4000; ++i)
+      recorder.take(std::to_string(i) + std::string(95, 'n') + ":1|c");
+  });
+  fold();
+  EXPECT_EQ(scalar("4091"), 2);
+  const int fits = (kBHNamesBytes - 91) / 99;  // exactly: 91 bytes are its own keys
+  EXPECT_EQ(fault("refused", ""), 2 * 4 + 3000 - fits);
+  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4 + 1} + fits);
+}
+
+TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
+  const std::string path = root / "statsd.sock";
+  auto unixSocket = openUnixSocket(path);
+  auto loopback = openLoopbackSocket(0);
+  ASSERT_TRUE(unixSocket && loopback);
+  sockaddr_in address{};
+  socklen_t size = sizeof address;
+  getsockname(loopback->descriptor(), reinterpret_cast<sockaddr*>(&address), &size);
+  // They wait for the program, which starts because of them.
+  const std::string longest = std::string(kLongestDatagram - 7, '\n') + "long:1|c";
+  send(AF_UNIX, unixAddress(path), {"u:1|c", longest.substr(1), longest, std::string()});
+  send(AF_INET, address, {"i:2|c", "i:3|c\n", "t:1.5|ms"});
+  const pid_t child = start([&] {
+    dup2(unixSocket->descriptor(), 100);
+    dup2(loopback->descriptor(), 101);
+    dup2(100, 3);
+    dup2(101, 4);
+    setenv("LISTEN_PID", std::to_string(getpid()).c_str(), 1);
+    setenv("LISTEN_FDS", "2", 1);
+    execl(kProgram.c_str(), "tavrel-statsd", "--idle", "1", "--udp", "1", nullptr);
+  });
+  EXPECT_EQ(waitFor(child), 0);
+  testClock().realtime = 0;
+  fold();
+  for (const auto& [keyAndDay, value] : scalars) {
+    const std::string& key = keyAndDay.first;
+    EXPECT_EQ(value, key == "statsd.i" ? 5 : 1) << key;
+  }
+  EXPECT_EQ(scalars.size(), 4U);
+  EXPECT_EQ(fault("too_long"), 1);
+  EXPECT_EQ(records["statsd.t"], std::vector<double>{1.5});
+}
+
+TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
+  const std::string path = root / "own.sock";
+  { auto left = openUnixSocket(path); }  // as after a kill
+  const pid_t child = start([&] {
+    execl(kProgram.c_str(), "tavrel-statsd", "--unix", path.c_str(), "--prefix", "", "--idle", "0",
+          nullptr);
+  });
+  const Descriptor sender(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  const sockaddr_un address = unixAddress(path);
+  while (connect(sender.get(), reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0)
+    sched_yield();
+  EXPECT_EQ(write(sender.get(), "own:1|c", 7), 7);
+  testClock().realtime = 0;
+  while (scalars.empty())
+    fold();
+  EXPECT_EQ(scalars.begin()->first.first, "own");
+
+  const std::string taken = "cannot listen at " + path + ": Address already in use\n";
+  const std::tuple<std::string, int, std::string> cases[] = {
+      {"--unix " + path, 1, taken},
+      {"--unix /x/" + std::string(106, 'x'), 1,
+       "cannot listen at /x/" + std::string(106, 'x') + ": give a path of at most 107 bytes\n"},
+      {"--unix /dev/null/x", 1, "cannot listen at /dev/null/x: Not a directory\n"},
+      {"--udp 0", 2, "not a port: 0: give 1 to 65535\n"},
+      {"--udp 65536", 2, "not a port: 65536: give 1 to 65535\n"},
+      {"--prefix 'a b'", 2,
+       "not a prefix: a b: give letters, digits, '.', '_' and '-', at most 200\n"},
+      {"--idle 86401", 2, "not a time: 86401: give 0 to 86400 seconds\n"},
+      {"x", 2, "no argument 'x': see --help\n"}};
+  for (const auto& [options, status, message] : cases)
+    EXPECT_EQ(outputOf(kProgram + " " + options, status), "tavrel-statsd: " + message);
+  EXPECT_EQ(
+      outputOf("exec 3</dev/null; LISTEN_FDS=1 exec sh -c 'LISTEN_PID=$$ exec " + kProgram + "'",
+               1),
+      "tavrel-statsd: descriptor 3 of LISTEN_FDS is no datagram socket: use ListenDatagram= "
+      "in the socket unit\n");
+  kill(child, SIGTERM);
+  EXPECT_EQ(waitFor(child), SIGTERM);
+}
+
+}  // namespace
+}  // namespace tavrel

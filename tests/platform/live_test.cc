@@ -1,0 +1,125 @@
+// Live services: sensors that block, files that stay open, recordings beside them, large tables.
+
+#include <fcntl.h>
+#include <sys/stat.h>
+
+#include "device_services.h"
+#include "platform/linux/live/live_machine.h"
+#include "platform/linux/recorded/recorded_registry.h"
+#include "platform/report_protocol.h"
+
+namespace tavrel {
+namespace {
+
+const std::string kZone = "/sys/class/thermal/thermal_zone";
+
+// The channels of all live services, subscribed.
+struct Subscribed {
+  explicit Subscribed(LiveServices& live) : sampling(live.subscribe()) {
+    for (const plist::Value& service : live.services()) {
+      const auto record = service.dictionary();
+      const auto driver = static_cast<std::uint64_t>(record.number("EntryID")->int64());
+      for (const plist::Value& group : record.dictionary("Properties").array("IOReportLegend")) {
+        for (const plist::Value& channel : group.dictionary().array("IOReportChannels")) {
+          const auto id = static_cast<std::uint64_t>(channel.array().at(0).number()->int64());
+          EXPECT_EQ(sampling->add(driver, id), kElementBytes);
+          names.emplace_back(*channel.array().at(2).string());
+        }
+      }
+    }
+  }
+  /// "NAME=VALUE " of those that have one after an update.
+  std::string update() {
+    sampling->update();
+    std::string text;
+    std::vector<std::byte> room(kElementBytes);
+    for (std::size_t i = 0; i < names.size(); ++i) {
+      if (sampling->write(i, room) == 0) continue;
+      text += format("%s=%lld ", names[i], *loadLittle64(room, kElementFirstValue));
+    }
+    return text;
+  }
+  std::unique_ptr<LiveSampling> sampling;
+  std::vector<std::string> names;
+};
+
+TEST(LiveMachineTest, ASensorThatBlocksHidesNoOther) {
+  DeviceServices device;
+  for (const char* const zone : {"0", "1", "2"})
+    device.write(kZone + zone + "/temp", std::string(zone) + "000\n");
+  const std::string path = device.root.path(kZone + "1/temp");
+  std::filesystem::remove(path);
+  ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
+  device.write("/proc/uptime", "5\n");
+
+  LiveMachine live(device.root, device.log, {50, 5000});
+  Subscribed channels(live);
+  const std::string others =
+      "boot.seconds=5 thermal_zone0.zone_temp=0 thermal_zone2.zone_temp=2000 thermal.hottest=2000 ";
+  EXPECT_EQ(channels.update(), others);
+  EXPECT_EQ(device.log.lines,
+            Lines{path + " does not answer within 50 ms: left out until it does"});
+  // Nobody waits for it, or says so, again.
+  EXPECT_EQ(channels.update(), others);
+  EXPECT_EQ(device.log.lines.size(), 1U);
+  Descriptor(open(path.c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
+}
+
+TEST(LiveMachineTest, FilesStayOpen) {
+  DeviceServices device;
+  const std::string path = kZone + "0/temp";
+  device.write(path, "10\n");
+  device.write("/proc/uptime", "1\n");
+  LiveMachine live(device.root, device.log);
+  Subscribed channels(live);
+  EXPECT_EQ(channels.update(), "boot.seconds=1 thermal_zone0.zone_temp=10 thermal.hottest=10 ");
+  device.write(path, "11\n");
+  // A new file of the same name is not the one that is open.
+  std::filesystem::remove(device.root.path("/proc/uptime"));
+  device.write("/proc/uptime", "2\n");
+  EXPECT_EQ(channels.update(), "boot.seconds=1 thermal_zone0.zone_temp=11 thermal.hottest=11 ");
+  // A device that tells no more takes only its own channels with it.
+  device.write(path, "");
+  EXPECT_EQ(channels.update(), "boot.seconds=1 ");
+}
+
+TEST(LiveMachineTest, ManyInterfacesHideNothing) {
+  DeviceServices device;
+  std::string table = "one\ntwo\n";
+  for (int i = 0; i < 10'000; ++i)
+    table += format("if%d: %d 2\n", i, i);
+  device.write("/proc/net/dev", table);
+  device.write("/proc/uptime", "5\n");
+  LiveMachine live(device.root, device.log);
+  Subscribed channels(live);
+  EXPECT_EQ(channels.names.size(), 20'001U);
+  const std::string text = channels.update();
+  EXPECT_TRUE(text.starts_with("boot.seconds=5 if0.rx_bytes=0 if0.rx_packets=2 "));
+  EXPECT_TRUE(text.ends_with(" if9999.rx_bytes=9999 if9999.rx_packets=2 "));
+}
+
+TEST(LiveMachineTest, ARecordedServiceTakesThePlaceOfALiveOne) {
+  DeviceServices device;
+  device.write("/proc/uptime", "5\n");
+  device.write("/proc/vmstat", "oom_kill 1\n");
+  device.write(
+      "/var/lib/tavrel/registry/a.plist",
+      R"(<?xml version="1.0" encoding="UTF-8"?><plist version="1.0"><dict><key>Services</key>
+<array><dict><key>Class</key><string>LinuxBoot</string><key>Name</key><string>boot</string></dict>
+<dict><key>Class</key><string>LinuxMemory</string></dict></array></dict></plist>)");
+  LiveMachine live(device.root, device.log);
+  RecordedRegistry registry(device.root, device.files, device.coding, device.log, &live);
+  std::unique_ptr<ServiceIterator> services;
+  EXPECT_EQ(registry.matchingServices(plist::Dictionary::create(), services), kKernelSuccess);
+  std::string names;
+  std::string name;
+  while (const auto service = services->next())
+    names += service->name(name) == kKernelSuccess ? name + ' ' : "? ";
+  // The second has the class of a live service, but not its name.
+  EXPECT_EQ(names, "boot LinuxMemory memory IOReportHub ");
+  EXPECT_EQ(registry.liveServices().size(), 1U);
+  EXPECT_EQ(registry.recording().array("Services").size(), 2U);
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,47 @@
+// Processes that are forked and, some of them, killed before a system call.
+#pragma once
+
+#include <cstddef>
+#include <fcntl.h>
+#include <functional>
+#include <signal.h>
+#include <string>
+#include <sys/ptrace.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+namespace tavrel {
+
+/// Runs `body` in a forked process with its standard error in `errorFile`; yields the process.
+inline int forkProcess(const std::function<void()>& body,
+                       const std::string& errorFile = "/dev/null") {
+  const int child = ::fork();
+  if (child != 0) return child;
+  const int errors = ::open(errorFile.c_str(), O_WRONLY | O_CREAT | O_TRUNC, 0600);
+  ::dup2(errors, STDERR_FILENO);
+  body();
+  ::_exit(0);
+}
+
+/// Runs `body` in a forked process that is killed before its system call number `calls`. False when
+/// it ended before that.
+inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& body) {
+  const int child = forkProcess([&] {
+    ::ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
+    ::raise(SIGSTOP);
+    body();
+  });
+  int status = 0;
+  ::waitpid(child, &status, 0);
+  // Every call stops the process twice: before it and after it.
+  for (std::size_t stop = 0; stop < 2 * calls + 1; ++stop) {
+    ::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr);
+    ::waitpid(child, &status, 0);
+    if (WIFEXITED(status) || WIFSIGNALED(status)) return false;
+  }
+  ::kill(child, SIGKILL);
+  ::waitpid(child, &status, 0);
+  return true;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,61 @@
+// What programs record, as the tool shows and folds it.
+#include "brimhold/client.h"
+#include "device.h"
+
+namespace tavrel {
+namespace {
+
+TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
+  const TemporaryDevice device;
+  device.check("stat fold", prints("nothing to fold: the device has no folder /run/tavrel/stat\n"));
+  device.run("stat import", "scalar\t2\tapp.old\t1\nvalue\t2\tapp.t\t5\t0.5\n");
+  const std::filesystem::path folder = device.path("/run/tavrel/stat");
+  std::filesystem::create_directories(folder);
+  device.check("stat fold", prints("0 segments: 0 scalars, 0 values; 0 removed\n"));
+  EXPECT_EQ(inChild([&] {
+              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
+              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
+              for (const double value : {1.5, 2.5})
+                BHClientDistributionRecord(BHClientDistributionForKey("app.t"), value);
+              return 0;
+            }),
+            0);
+  std::ofstream(folder / "x.segment") << "no segment";
+  const Lines readings{
+      "stat list",       "stat list --json", "stat list app.t --day today",  "stat show app.t",
+      "stat show app.n", "stat export",      "stat export app.t --day today"};
+  std::vector<Outcome> before;
+  for (const std::string& reading : readings)
+    before.push_back(device.run(reading));
+  const auto json = device.json("stat list");
+  EXPECT_EQ(json["scalars"][1]["value"], 3);
+  EXPECT_EQ(json["distributions"][1]["count"], 2);
+  EXPECT_EQ(before[5].out.find("scalar\t2\tapp.old\t1\nscalar\t"), 0U) << before[5];
+  EXPECT_EQ(device.run("stat show app.none").status, 1);
+
+  const Outcome folded = device.run("stat fold");
+  EXPECT_EQ(folded.out, "1 segment: 1 scalar, 2 values; 1 removed\nrefused: 0 values, 1 file\n");
+  EXPECT_EQ(folded.error, "tavrelctl: \"x.segment\" in " + folder.string() +
+                              " is refused: not a segment; remove it\n");
+  EXPECT_EQ(folded.status, 0);
+  for (std::size_t i = 3; i < readings.size(); ++i) {
+    if (i != 5) {
+      EXPECT_EQ(device.run(readings[i]), before[i]) << readings[i];
+    }
+  }
+  EXPECT_EQ(device.json("stat fold"),
+            R"({"format_version": 1, "segments": 0, "scalars": 0, "values": 0, "removed": 0,
+                "waiting": 0, "dropped": 0, "refused": 0, "segments_refused": 0})"_json);
+  EXPECT_NE(device.run("stat list").out.find("com.norvane.brimhold.segments_refused"),
+            std::string::npos);
+  std::filesystem::remove_all(device.path("/var"));
+  device.write("/var", "");
+  const Outcome failed = device.run("stat fold");
+  EXPECT_EQ(failed.status, 1);
+  EXPECT_NE(failed.error.find("; what programs recorded waits for the next fold\n"),
+            std::string::npos)
+      << failed;
+}
+
+}  // namespace
+}  // namespace tavrel

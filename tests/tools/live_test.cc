@@ -1,0 +1,266 @@
+// The kernel's figures as channels: trees of files in, reports out.
+
+#include <sys/stat.h>
+
+#include "tests/tools/device.h"
+
+namespace tavrel {
+namespace {
+
+struct File {
+  std::string path, content;
+};
+
+const std::string kCpu = "/sys/devices/system/cpu/";
+const std::string kZone = "/sys/class/thermal/";
+const std::string kHwmon = "/sys/class/hwmon/";
+
+struct LiveDevice : TemporaryDevice {
+  LiveDevice(const std::vector<File>& files) {
+    std::filesystem::create_directory(path("/proc"));
+    for (const File& file : files)
+      write(file.path, file.content);
+  }
+  /// "NAME=VALUE ..." of the channels, an array's values with commas, a state's as
+  /// "NAME:ENTRIES/RESIDENCY", with a '*' when it is the current one.
+  std::string values(const std::string& options = {}) const {
+    std::string text;
+    const auto outcome = run("report sample --json " + options);
+    const auto json = nlohmann::json::parse(outcome.out, nullptr, false);
+    if (json.is_discarded()) return outcome.error;
+    for (const auto& channel : json["channels"]) {
+      text += channel["name"].get<std::string>() + '=';
+      if (channel.contains("value")) text += channel["value"].dump();
+      for (const auto& value : channel.value("values", nlohmann::json::array()))
+        text += (value.is_null() ? "-" : value.dump()) + ',';
+      for (const auto& state : channel.value("states", nlohmann::json::array())) {
+        text += state["name"].get<std::string>() + ':' + state["in_transitions"].dump() + '/' +
+                state["residency"].dump() + (state["current"] == true ? "* " : " ");
+      }
+      text += ' ';
+    }
+    return text;
+  }
+};
+
+struct Row {
+  std::vector<File> files;
+  std::string values;
+};
+
+TEST(LiveTest, ReadsTheFormsOfTheKernel) {
+  const Row rows[] = {
+      {{{"/proc/uptime", "93784.87 12.01\n"}}, "boot.seconds=93784 "},
+      {{{"/proc/pressure/io",
+         "some avg10=0.00 avg60=1.00 avg300=0.00 total=77\nfull avg10=0.00 avg60=0.00 "
+         "avg300=0.00 total=5\n"}},
+       "io.pressure_some=77 io.pressure_full=5 "},
+      {{{"/proc/schedstat", "version 15\ntimestamp 1\ncpu1 0 0 0 0 0 0 11 22 33\ndomain0 3 9\n"}},
+       "cpu1.sched_run=11 cpu1.sched_wait=22 cpu1.sched_slices=33 "},
+      {{{"/proc/vmstat", "nr_free_pages 9\npswpin 3\npgpgin 2\noom_kill 1\nother x\n"}},
+       "memory.paged_in=2048 memory.swapped_in=" + std::to_string(3 * sysconf(_SC_PAGESIZE)) +
+           " memory.oom_kills=1 "},
+      {{{"/proc/meminfo", "MemTotal:       100 kB\nDirty:     x kB\nSlab: 7 kB\n"}},
+       "memory.total=100 memory.slab=7 "},
+      // 2 has the columns of older kernels; partitions are no devices.
+      {{{"/proc/diskstats",
+         " 8 0 sda 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16 17\n 8 1 sda1 1 2 3 4 5 6 7 8 9 10 11\n"
+         " 8 16 c/d0 1 2 3 4 5 6 7 8 9 10 11\n"},
+        {"/sys/block/sda/device/x", ""},
+        {"/sys/block/c!d0/x", ""}},
+       "sda.reads=1 sda.read_merges=2 sda.writes=5 sda.write_merges=6 sda.discards=12 "
+       "sda.discard_merges=13 sda.flushes=16 sda.read_bytes=1536 sda.written_bytes=3584 "
+       "sda.discarded_bytes=7168 sda.read_time=4 sda.write_time=8 sda.io_time=10 "
+       "sda.weighted_time=11 sda.discard_time=15 sda.flush_time=17 sda.in_flight=9 c/d0.reads=1 "
+       "c/d0.read_merges=2 c/d0.writes=5 c/d0.write_merges=6 c/d0.read_bytes=1536 "
+       "c/d0.written_bytes=3584 c/d0.read_time=4 c/d0.write_time=8 c/d0.io_time=10 "
+       "c/d0.weighted_time=11 c/d0.in_flight=9 disks.read_bytes=1536 disks.written_bytes=3584 "
+       "disks.discarded_bytes=7168 disks.writes=5 disks.flushes=16 disks.io_time=10 "},
+      {{{"/proc/stat",
+         "cpu  9 8 7 6 5 4 3 2 1 0\ncpu2 1 2 3 4 5 6 7 8 9 10\nintr 44 1 2\n"
+         "ctxt 55\nbtime 1\nprocesses 66\n"}},
+       "cpu.user=90 cpu.nice=80 cpu.system=70 cpu.idle=60 cpu.iowait=50 cpu.irq=40 cpu.softirq=30 "
+       "cpu.steal=20 cpu.interrupts=44 cpu.switches=55 cpu.forks=66 cpu2.user=10 cpu2.nice=20 "
+       "cpu2.system=30 cpu2.idle=40 cpu2.iowait=50 cpu2.irq=60 cpu2.softirq=70 cpu2.steal=80 "
+       "cpu2.guest=90 cpu2.guest_nice=100 "},
+      {{{"/sys/block/zram0/mm_stat", " 1 2 3 4 5 6\n"}, {"/sys/block/zram0/bd_stat", "7 8 9\n"}},
+       "zram0.zram_data=1 zram0.zram_compressed=2 zram0.zram_used=3 zram0.zram_limit=4 "
+       "zram0.zram_used_max=5 zram0.zram_same_pages=6 zram0.zram_backed=7 "
+       "zram0.zram_backing_reads=8 zram0.zram_backing_writes=9 "},
+      // Processor 1 does not run; numbers of interrupts are of no account, handlers are.
+      {{{"/proc/interrupts",
+         "       CPU0 CPU2\n 3: 1 2 GIC 9 Level a, b c\n 4: 10 20 GIC 8 Edge b c\n"
+         " 5: 5 6 GIC 7 Edge b c\nNMI: 7 8 Non-maskable\nERR: 4\n"}},
+       "irq.c=16,-,28,-, irq.NMI=7,-,8,-, irq.ERR=4,-,-,-, "},
+      {{{kCpu + "cpu0/cpuidle/state0/name", "POLL\n"},
+        {kCpu + "cpu0/cpuidle/state0/time", "5\n"},
+        {kCpu + "cpu0/cpuidle/state0/usage", "1\n"},
+        {kCpu + "cpu0/cpuidle/state1/name", "retention deep 1\n"},
+        {kCpu + "cpu0/cpuidle/state1/time", "6\n"},
+        {kCpu + "cpu0/cpuidle/state1/usage", "2\n"},
+        {kCpu + "cpu0/cpuidle/state2/name", "retention deep 2\n"},
+        {kCpu + "cpu0/cpuidle/state2/time", "7\n"},
+        {kCpu + "cpu0/cpuidle/state2/usage", "3\n"}},
+       "cpu0.idle_states=POLL:1/5 1:retent:2/6 2:retent:3/7  "},
+      {{{kCpu + "cpufreq/policy0/stats/time_in_state", "1800000 3\n600500 4\n"},
+        {kCpu + "cpufreq/policy0/stats/trans_table",
+         "   From  :    To\n         :   1800000    600500\n  1800000:         0         7\n"
+         "   600500:         8         0\n"},
+        {kCpu + "cpufreq/policy0/stats/total_trans", "15\n"},
+        {kCpu + "cpufreq/policy0/scaling_cur_freq", "600500\n"}},
+       "policy0.frequency=1800MHz:8/30 600500k:7/40*  policy0.frequency_changes=15 "},
+      {{{"/sys/class/devfreq/gpu/trans_stat",
+         "     From  :   To\n           : 200000000 400000000   time(ms)\n"
+         "*  200000000:         0         3       12\n   400000000:         2         0       34\n"
+         "Total transition : 5\n"},
+        {"/sys/class/devfreq/gpu/cur_freq", "200000000"}},
+       "gpu.frequency=200MHz:2/12* 400MHz:3/34  "},
+      // Without the table of transitions the entries are not known; they are not 0.
+      {{{kZone + "cooling_device0/type", "fan\n"},
+        {kZone + "cooling_device0/stats/time_in_state_ms", "state0\t5\nstate1\t6\n"},
+        {kZone + "cooling_device1/type", "cpu\n"},
+        {kZone + "cooling_device1/cur_state", "1\n"},
+        {kZone + "cooling_device1/stats/time_in_state_ms", "state0\t7\nstate1\t8\n"},
+        {kZone + "cooling_device1/stats/trans_table",
+         " From  :    To\n       : state 0  state 1\nstate 0:       0       9\n"
+         "state 1:       3       0\n"}},
+       "fan.cooling_states=state0:null/5 state1:null/6  cpu.cooling_states=state0:3/7 "
+       "state1:9/8*  "},
+      {{{kZone + "thermal_zone0/type", "soc\n"},
+        {kZone + "thermal_zone0/temp", "41000\n"},
+        {kZone + "thermal_zone1/type", "acpitz\n"},
+        {kZone + "thermal_zone1/temp", "-5000\n"},
+        {kZone + "thermal_zone2/type", "acpitz\n"},
+        {kZone + "thermal_zone2/temp", "39000\n"}},
+       "soc.zone_temp=41000 acpitz@thermal_zone1.zone_temp=-5000 "
+       "acpitz@thermal_zone2.zone_temp=39000 thermal.hottest=41000 "},
+      {{{kHwmon + "hwmon1/name", "chip\n"},
+        {kHwmon + "hwmon1/temp10_input", "1\n"},
+        {kHwmon + "hwmon1/temp1x_input", "9\n"},
+        {kHwmon + "hwmon1/in0_input", "2\n"},
+        {kHwmon + "hwmon1/temp1_crit", "9\n"},
+        {kHwmon + "hwmon1/fan1_input", "3\n"}},
+       "chip.temp10=1 chip.in0=2 chip.fan1=3 sensors.hottest=1 "},
+      {{{"/sys/class/power_supply/BAT0/cycle_count", "210\n"},
+        {"/sys/class/power_supply/BAT0/temp", "305\n"}},
+       "BAT0.cycles=210 BAT0.battery_temp=30500 battery.cycles=210 "},
+      {{{"/sys/devices/system/edac/mc/mc0/ce_count", "4\n"},
+        {"/sys/devices/system/edac/mc/mc0/dimm1/dimm_ce_count", "3\n"},
+        {"/sys/devices/system/edac/mc/mc1/ce_count", "5\n"}},
+       "mc0.corrected=4 mc0.dimm1.corrected=3 mc1.corrected=5 memory.corrected_errors=9 "},
+      {{{"/sys/power/suspend_stats/success", "4\n"}, {"/sys/power/suspend_stats/fail", "1\n"}},
+       "suspend.success=4 suspend.failed=1 "},
+      {{{"/sys/fs/ext4/sda1/errors_count", "2\n"}, {"/sys/fs/ext4/features/x", "supported\n"}},
+       "sda1.fs_errors=2 fs.errors=2 "},
+      {{{"/sys/fs/pstore/dmesg-ramoops-0", ""}, {"/sys/class/watchdog/watchdog0/bootstatus", "32"}},
+       "boot.crash_records=1 watchdog0.bootstatus=32 boot.watchdog_status=32 "},
+      {{{"/sys/fs/cgroup/cgroup.controllers", "cpu"},
+        {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
+        {"/sys/fs/cgroup/a.slice/cpu.stat", "usage_usec 10\nnr_throttled 2\n"},
+        {"/sys/fs/cgroup/a.slice/memory.events", "low 0\noom_kill 1\n"},
+        {"/sys/fs/cgroup/a.slice/memory.current", "4096\n"},
+        {"/sys/fs/cgroup/a.slice/memory.peak", "max\n"},
+        {"/sys/fs/cgroup/a.slice/io.stat",
+         "8:0 rbytes=1 wbytes=2 rios=3 wios=4 dbytes=0 dios=0\n8:16 rbytes=10 wbytes=20 rios=30 "
+         "wios=40 dbytes=0 dios=0\n"}},
+       "a.slice.cpu=10 a.slice.cpu_throttles=2 a.slice.memory_oom_kills=1 "
+       "a.slice.io_reads=33 a.slice.io_writes=44 a.slice.io_read_bytes=11 "
+       "a.slice.io_written_bytes=22 a.slice.memory=4096 "},
+  };
+  for (const Row& row : rows) {
+    const LiveDevice device(row.files);
+    // By groups of one unit; here the order of channels is that of the report.
+    EXPECT_EQ(device.values(), row.values) << row.files[0].path;
+  }
+}
+
+TEST(LiveTest, OneBadFileHidesNothingElse) {
+  const std::string zone = kZone + "thermal_zone";
+  const std::string garbage(4096, '\x7f');
+  const LiveDevice device({{zone + "0/type", "a\n"},
+                           {zone + "0/temp", "1\n"},
+                           {zone + "1/type", "empty\n"},
+                           {zone + "1/temp", ""},
+                           {zone + "2/type", "folder\n"},
+                           {zone + "2/temp/x", ""},
+                           {zone + "3/type", garbage},
+                           {zone + "3/temp", garbage},
+                           {zone + "4/type", "bell\a\n"},
+                           {zone + "4/temp", "99999999999999999999\n"},
+                           {zone + "5/type", std::string(300, 'n') + '\n'},
+                           {zone + "5/temp", "0x10\n"},
+                           {zone + "6/type", "half\n"},
+                           {zone + "6/temp", "12 34\n"},
+                           {"/proc/interrupts", ""},
+                           {"/proc/stat", garbage},
+                           {"/proc/diskstats", "\n\n8\n8 0\n8 0 sda\n"},
+                           {"/sys/block/sda/x", ""},
+                           {"/proc/net/dev", "one\ntwo\n"},
+                           {"/proc/uptime", "soon\n"}});
+  EXPECT_EQ(device.values(), "a.zone_temp=1 bell_~7ef23bcd.zone_temp=9223372036854775807 " +
+                                 std::string(55, 'n') +
+                                 "~088f4495.zone_temp=16 thermal.hottest=9223372036854775807 ");
+  const Outcome sample = device.run("report sample --group Thermal");
+  EXPECT_EQ(sample.status, 0);
+  EXPECT_EQ(sample.error,
+            "tavrelctl: 4 channels without values: their devices do not tell them now, or the hub "
+            "does not know them\n");
+}
+
+TEST(LiveTest, ARootShowsOnlyItsOwnFolders) {
+  const TemporaryDevice bare;
+  bare.write("/sys/devices/system/edac/mc/mc0/ce_count", "1\n");
+  bare.check("report list", prints("no channels\n"));
+  // A link makes the machine's own folder the root's.
+  std::filesystem::create_symlink("/proc", bare.path("/proc"));
+  EXPECT_EQ(bare.run("report sample --group Boot --live").status, 0);
+}
+
+TEST(LiveTest, DrivesAsleepAreNotRead) {
+  const LiveDevice device({{kHwmon + "hwmon0/name", "drivetemp\n"},
+                           {kHwmon + "hwmon0/temp1_input", "30000\n"},
+                           {kHwmon + "hwmon0/device/power/runtime_status", "suspended\n"}});
+  EXPECT_EQ(device.values(), "");
+  device.write(kHwmon + "hwmon0/device/power/runtime_status", "active\n");
+  EXPECT_EQ(device.values(), "drivetemp.temp1=30000 sensors.hottest=30000 ");
+}
+
+// What is recorded plays back the same, in place of the live services.
+TEST(LiveTest, RecordsWhatIsLive) {
+  const LiveDevice device({{"/proc/uptime", "7.00 1.00\n"},
+                           {"/proc/softirqs", "     CPU0 CPU1\n HI: 1 2\n"},
+                           {kZone + "thermal_zone0/temp", "5\n"},
+                           {kZone + "thermal_zone1/temp", "\n"}});
+  const Outcome live = device.run("report sample");
+  const std::string file = device.path("/live.plist");
+  EXPECT_EQ(device.run("registry record --live " + file), prints(""));
+  TemporaryDevice other;
+  other.write("/var/lib/tavrel/registry/live.plist", contentOf(file));
+  EXPECT_EQ(other.run("report sample").out, live.out);
+  other.check("report list --live", prints("no channels\n"));
+  EXPECT_EQ(other.run("report list --recorded").out, device.run("report list --live").out);
+
+  // Ids do not depend on the machine or the boot.
+  other.write("/proc/uptime", "8.00 1.00\n");
+  EXPECT_EQ(other.run("report sample").out, live.out);
+  EXPECT_EQ(device.run("registry list").out, other.run("registry list").out);
+  device.check("registry record --seconds 1 -",
+               fails("--seconds is for --live: recordings are written as they stand", 2));
+}
+
+// Every daily figure of this machine is in the example, which has nothing to complain about.
+TEST(LiveTest, TheExampleListsTheDailyFigures) {
+  const std::string file = TAVREL_EXAMPLES "/whitelist-live.plist";
+  EXPECT_EQ(TemporaryDevice::runAt("/", "whitelist check " + file).status, 0);
+  const Outcome list = TemporaryDevice::runAt("/", "report list --live --category 0x100 --json");
+  const auto json = nlohmann::json::parse(list.out);
+  EXPECT_GE(json["channels"].size(), 10U);
+  const std::string whitelist = contentOf(file);
+  for (const auto& channel : json["channels"]) {
+    const std::string key = "<key>com.norvane.ioreport." + channel["name"].get<std::string>() + '<';
+    EXPECT_NE(whitelist.find(key), std::string::npos) << key;
+  }
+}
+
+}  // namespace
+}  // namespace tavrel

@@ -1,0 +1,68 @@
+#include "tools/report/report_sampler.h"
+
+#include <optional>
+#include <string>
+
+#include "base/format.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/recorded/recorded_registry.h"
+#include "platform/linux/recorded/recording_folder.h"
+
+namespace tavrel {
+
+Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
+                                             const ReportSelection& selection) {
+  auto channels = selectChannels(noting.platform(), selection);
+  if (noting.hasErrors()) context.setExitStatus(kExitFailure);
+  // For a driver whose channels cannot be read, the notes have only the library's words.
+  if (channels && noting.hasPrinted()) {
+    context.note(
+        "these drivers are left out: 'tavrelctl registry show ID' shows what they publish");
+  }
+  if (channels && selection.live != selection.recorded) {
+    keepOrigin(*channels, selection, context.linuxPlatform().registry().liveServices());
+  }
+  return channels;
+}
+
+Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
+    : context_(context), noting_(context) {
+  const auto selected = selectedChannels(context, noting_, selection);
+  if (!selected) {
+    context.fail(selected.error().message);
+    return;
+  }
+  if (IOReportGetChannelCount(*selected) == 0) {
+    context.fail("no such channel is published: 'tavrelctl report list' shows what there is");
+    return;
+  }
+  std::optional<ErrorObject> error;
+  subscription_ = IOReportCreateSubscription(noting_.platform().drivers, nullptr, *selected,
+                                             &subscribed_, 0, &error);
+  if (subscription_) return;
+  const bool isHubMissing = error && error->code == kKernelNotFound && !reasonOf(error);
+  std::string advice(kLookAtDrivers);
+  if (isHubMissing) {
+    advice = format("there is no hub: a recording in %s must have a \"Hub\"", kRecordingFolder);
+  }
+  context.fail(reportFailure("subscribe to the channels", error, advice));
+}
+
+plist::Dictionary Sampler::sample() {
+  std::optional<ErrorObject> error;
+  auto samples = IOReportCreateSamples(subscription_.get(), subscribed_, &error);
+  if (!samples) context_.fail(reportFailure("sample the channels", error));
+  return samples;
+}
+
+std::int32_t Sampler::missing(const plist::Dictionary& samples) const {
+  return IOReportGetChannelCount(subscribed_) - IOReportGetChannelCount(samples);
+}
+
+const char* Sampler::reasonForMissing() const {
+  const bool isAnyLive = !context_.linuxPlatform().registry().liveServices().empty();
+  return isAnyLive ? "their devices do not tell them now, or the hub does not know them"
+                   : "the hub does not know them";
+}
+
+}  // namespace tavrel

@@ -1,0 +1,96 @@
+#include "tools/stat/record_commands.h"
+
+#include <charconv>
+#include <memory>
+#include <vector>
+
+#include "base/format.h"
+#include "tools/stat/import_number.h"
+#include "tools/stat/value_recorder.h"
+
+namespace tavrel {
+namespace {
+
+struct Arguments {
+  std::string key;
+  std::string number;
+  std::vector<std::string> values;
+};
+
+// Hands a recorder and the time to `give`, and reports what went wrong.
+template <class Give>
+void keep(ToolContext& context, Give give) {
+  const auto recorder = openRecorder(context);
+  if (!recorder) return context.fail(recorder.error().message);
+  Status done = give(**recorder, valueTimeNow());
+  if (done) done = (*recorder)->keep();
+  if (!done) context.fail(done.error().message);
+}
+
+// False after a message.
+bool checkKey(ToolContext& context, const std::string& key) {
+  const std::string fault = keyFault(key);
+  if (!fault.empty()) context.failUsage(fault);
+  return fault.empty();
+}
+
+template <Status (ValueRecorder::*operation)(ValueTime, const std::string&, std::int64_t)>
+void changeScalar(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
+  std::int64_t number = 0;
+  const char* const end = arguments.number.data() + arguments.number.size();
+  const auto [stop, error] = std::from_chars(arguments.number.data(), end, number);
+  if (error != std::errc() || stop != end) {
+    return context.failUsage(format("not a 64-bit integer: %s", arguments.number));
+  }
+  keep(context, [&](ValueRecorder& recorder, ValueTime now) {
+    return (recorder.*operation)(now, arguments.key, number);
+  });
+}
+
+void record(ToolContext& context, const Arguments& arguments) {
+  if (!checkKey(context, arguments.key)) return;
+  std::vector<double> values;
+  for (const std::string& text : arguments.values) {
+    const auto value = parseExactDouble(text);
+    if (!value) return context.failUsage(value.error().message);
+    values.push_back(*value);
+  }
+  keep(context, [&](ValueRecorder& recorder, ValueTime now) {
+    Status done = Done{};
+    for (std::size_t i = 0; done && i < values.size(); ++i)
+      done = recorder.append(now, arguments.key, values[i]);
+    return done;
+  });
+}
+
+using Action = void (*)(ToolContext&, const Arguments&);
+
+Command addCommand(Command group, const char* name, const char* description,
+                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                   Action action) {
+  const Command command = group.addCommand(name, description);
+  command.onRun([&context, arguments, action] { action(context, *arguments); });
+  command.addOption("KEY", arguments->key, "Name of the statistic").required();
+  return command;
+}
+
+}  // namespace
+
+void addRecordCommands(Command group, ToolContext& context) {
+  const auto arguments = std::make_shared<Arguments>();
+  addCommand(group, "set", "Set today's value of a scalar", arguments, context,
+             changeScalar<&ValueRecorder::set>)
+      .addOption("N", arguments->number, "64-bit integer")
+      .required();
+  addCommand(group, "add", "Add to today's value of a scalar", arguments, context,
+             changeScalar<&ValueRecorder::add>)
+      .addOption("N", arguments->number, "64-bit integer")
+      .required();
+  addCommand(group, "record", "Append values to today's distribution", arguments, context, record)
+      .addOption("VALUE", arguments->values,
+                 "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
+      .required();
+}
+
+}  // namespace tavrel

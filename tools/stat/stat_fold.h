@@ -1,0 +1,11 @@
+// tavrelctl stat fold
+#pragma once
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// Moves what programs recorded into the store, and says what that was.
+void foldStatistics(ToolContext& context);
+
+}  // namespace tavrel

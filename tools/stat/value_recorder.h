@@ -1,0 +1,44 @@
+// Where today's values go: into memory with libbrimhold, which any user may do and which writes
+// nothing to flash, or into the store when the device has no folder for that.
+//
+//   const auto recorder = openRecorder(context);
+//   recorder->add(time, "com.example.starts", 1);
+//   recorder->keep();
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+
+#include "base/expected.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// When a value was measured. Memory goes by its own look at the same clock.
+struct ValueTime {
+  std::int32_t day;
+  std::uint32_t secondsInDay;
+};
+ValueTime valueTimeNow();
+
+class ValueRecorder {
+ public:
+  virtual ~ValueRecorder() = default;
+  virtual Status set(ValueTime time, const std::string& key, std::int64_t value) = 0;
+  virtual Status add(ValueTime time, const std::string& key, std::int64_t amount) = 0;
+  virtual Status append(ValueTime time, const std::string& key, double value) = 0;
+  /// In the store: commits what was given since the last call, in one transaction. In memory, where
+  /// each value is kept at once: says whether any was dropped.
+  virtual Status keep() = 0;
+  virtual bool isInMemory() const = 0;
+};
+
+/// The context must outlive the recorder. libbrimhold looks its folder up once: one process records
+/// for one device.
+Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context);
+
+/// What is wrong with a key; nothing when it can be recorded and exported.
+std::string keyFault(const std::string& key);
+
+}  // namespace tavrel
