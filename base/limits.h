@@ -155,6 +155,16 @@ inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 /// system's own list of all locales has some 500.
 inline constexpr std::size_t kLanguages = 1'000;
 
+/// Bytes of the reading of a drive: some fifty figures.
+inline constexpr std::size_t kReadingBytes = 64U << 10;
+
+/// Bytes of what is remembered of drives: some four KiB each.
+inline constexpr std::size_t kHealthMemoryBytes = 4U << 20;
+
+/// Seconds after which a drive that was not seen is forgotten: more than a year, so that a drive
+/// that is plugged in once a year goes on counting.
+inline constexpr std::int64_t kDriveMemorySeconds = 400LL * 86'400;
+
 /// Bytes of a text of the kernel. The longest, /proc/interrupts of a machine with many processors,
 /// stays below.
 inline constexpr std::size_t kLiveFileBytes = 4U << 20;

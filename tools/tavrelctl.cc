@@ -12,6 +12,7 @@
 #include "tools/device/send_commands.h"
 #include "tools/device/status_command.h"
 #include "tools/device/tasking_commands.h"
+#include "tools/disks/disks_command.h"
 #include "tools/log/log_commands.h"
 #include "tools/log/nandlog_commands.h"
 #include "tools/nand/nand_commands.h"
@@ -67,14 +68,14 @@ struct Subcommand {
 // In the order of the help. Making them all takes longer than a short command, so a line that names
 // one of them gets only that.
 constexpr Subcommand kSubcommands[] = {
-    {"status", addStatusCommand},    {"rehearse", addRehearseCommand},
-    {"log", addLogCommands},         {"whitelist", addWhitelistCommands},
-    {"stat", addStatCommands},       {"send", addSendCommands},
-    {"notify", addNotifyCommands},   {"tasking", addTaskingCommands},
-    {"nand", addNandCommands},       {"nandlog", addNandlogCommands},
-    {"records", addRecordsCommands}, {"prefs", addPrefsCommands},
-    {"plist", addPlistCommands},     {"registry", addRegistryCommands},
-    {"report", addReportCommands},
+    {"status", addStatusCommand},      {"rehearse", addRehearseCommand},
+    {"log", addLogCommands},           {"whitelist", addWhitelistCommands},
+    {"stat", addStatCommands},         {"send", addSendCommands},
+    {"notify", addNotifyCommands},     {"tasking", addTaskingCommands},
+    {"disks", addDisksCommand},        {"nand", addNandCommands},
+    {"nandlog", addNandlogCommands},   {"records", addRecordsCommands},
+    {"prefs", addPrefsCommands},       {"plist", addPlistCommands},
+    {"registry", addRegistryCommands}, {"report", addReportCommands},
 };
 
 // The first argument that is neither an option nor the folder of --root; empty when there is none.

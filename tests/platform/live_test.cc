@@ -1,9 +1,11 @@
 // Live services: sensors that block, files that stay open, recordings beside them, large tables.
 
+#include <ctime>
 #include <fcntl.h>
 #include <sys/stat.h>
 
 #include "device_services.h"
+#include "platform/linux/health/reading.h"
 #include "platform/linux/live/live_machine.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/report_protocol.h"
@@ -106,6 +108,41 @@ TEST(LiveMachineTest, ManyInterfacesHideNothing) {
   const std::string text = channels.update();
   EXPECT_TRUE(text.starts_with("boot.seconds=5 if0.rx_bytes=0 if0.rx_packets=2 "));
   EXPECT_TRUE(text.ends_with(" if9999.rx_bytes=9999 if9999.rx_packets=2 "));
+}
+
+// Of drives, only what was read in this boot and within two days.
+TEST(LiveMachineTest, ShowsReadingsOfDrivesThatHold) {
+  using namespace health;
+  DeviceServices device;
+  device.write("/proc/sys/kernel/random/boot_id", "b1\n");
+  const auto writeReading = [&](const char* drive, const char* boot, std::int64_t age,
+                                const char* error, const Figures& figures) {
+    Reading reading;
+    reading.name = drive;
+    reading.time = std::time(nullptr) - age;
+    reading.boot = boot;
+    reading.error = error;
+    reading.figures = figures;
+    reading.growth = {{figureKind(DriveKind::Nvme, "written"), 512'000}};
+    device.write(format("/run/tavrel/health/%s.plist", drive), *encodeReading(reading));
+  };
+  const FigureKind* const spare = figureKind(DriveKind::Nvme, "spare_pct");
+  const FigureKind* const hours = figureKind(DriveKind::Nvme, "power_on_hours");
+  constexpr std::int64_t kTwoDays = 2 * 86'400;
+  writeReading("nvme0", "b1", kTwoDays - 60, "", {{spare, 97}, {hours, 8}});
+  writeReading("nvme1", "b1", kTwoDays + 60, "", {{spare, 1}});
+  writeReading("nvme2", "b0", 0, "", {{spare, 2}});
+  writeReading("nvme3", "b1", 0, "cannot read", {{spare, 3}});
+  writeReading("nvme4", "b1", 0, "", {{spare, 4}});
+  LiveMachine live(device.root, device.log);
+  Subscribed channels(live);
+  EXPECT_EQ(channels.update(),
+            "nvme0.power_on_hours=8 nvme0.spare_pct=97 nvme0.written_growth=512000 "
+            "nvme4.spare_pct=4 nvme4.written_growth=512000 ");
+  // A figure that a later reading lacks is unset, as are all of a drive that has gone.
+  writeReading("nvme0", "b1", 0, "", {{spare, 96}});
+  std::filesystem::remove(device.root.path("/run/tavrel/health/nvme4.plist"));
+  EXPECT_EQ(channels.update(), "nvme0.spare_pct=96 nvme0.written_growth=512000 ");
 }
 
 TEST(LiveMachineTest, ARecordedServiceTakesThePlaceOfALiveOne) {

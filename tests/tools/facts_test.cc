@@ -138,6 +138,9 @@ void fill(const TemporaryDevice& device) {
   device.write("/var/mobile/Library/Logs/CrashReporter/StructuredData/172-2026-11-27.jsonl",
                R"({"time":"2026-11-27T18:02:18.250Z","type":172,"record":{"id":4,"reg0":17}})"
                "\n");
+  device.write("/sys/class/ubi/ubi0/max_ec", "91\n");
+  device.write("/sys/class/ubi/ubi0/total_eraseblocks", "2048\n");
+  device.write("/sys/class/ubi/ubi0/eraseblock_size", "126976\n");
   device.run("prefs set com.example.a n 5125 --int");
   device.run("tasking schedule -",
              R"({"TaskingID": "t9", "TaskingDigest": "d8", "TaskingPayload": [
@@ -159,7 +162,7 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       "prefs list com.example.a|prefs get com.example.a n|plist show " +
       device.path("/var/mobile/Library/Preferences/com.example.a.plist") +
       "|registry list|registry show 4294967809|report list|report list --flat|report sample|"
-      "report sample --delta --interval 0");
+      "report sample --delta --interval 0|disks|disks --all");
   // Commands whose two outputs cannot be compared: each run differs (disk space, identifiers), a
   // run changes what the next one prints, or the text is a document of its own.
   std::set<std::string> covered{"log preview", "notify post", "notify wait",

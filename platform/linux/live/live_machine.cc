@@ -36,6 +36,7 @@ constexpr SourceEntry kSources[] = {
     {"LinuxMemory", "memory", addMemory},
     {"LinuxSwap", "swap", addSwapDevices},
     {"LinuxBlock", "block", addBlockDevices},
+    {"LinuxDriveHealth", "drive-health", addHealth},
     {"LinuxFileSystems", "file-systems", addFileSystems},
     {"LinuxNetwork", "network", addNetwork},
     {"LinuxInterrupts", "interrupts", addInterrupts},

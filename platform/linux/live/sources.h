@@ -16,6 +16,7 @@ void addCpuIdle(const DeviceRoot& root, LiveSource& source);
 void addCpuTime(const DeviceRoot& root, LiveSource& source);
 void addDeviceFrequency(const DeviceRoot& root, LiveSource& source);
 void addFileSystems(const DeviceRoot& root, LiveSource& source);
+void addHealth(const DeviceRoot& root, LiveSource& source);
 void addInterrupts(const DeviceRoot& root, LiveSource& source);
 void addMemory(const DeviceRoot& root, LiveSource& source);
 void addNetwork(const DeviceRoot& root, LiveSource& source);

@@ -1,0 +1,93 @@
+#include "platform/linux/health/ata_smart.h"
+
+#include <algorithm>
+#include <atasmart.h>
+#include <limits>
+#include <memory>
+
+namespace tavrel::health {
+namespace {
+
+enum Row : std::size_t {
+  kGood,
+  kTemperature,
+  kPowerOn,
+  kPowerCycles,
+  kBad,
+  kReallocated,
+  kPending,
+  kCrcErrors,
+  kFailing
+};
+constexpr FigureKind kKinds[] = {
+    {"smart_good", kPlain, Course::Gauge, "SMART RETURN STATUS", "1 good, 0 failing"},
+    {"temperature", kMillidegrees, Course::Gauge, "attribute 194 or 231", "temperature"},
+    {"power_on_hours", kPlain, Course::Lifetime, "attribute 9", "time under power"},
+    {"power_cycles", kEvents, Course::Lifetime, "attribute 12", "power cycles"},
+    {"bad_sectors", kEvents, Course::Gauge, "attributes 5 and 197",
+     "reallocated sectors and those that wait for it"},
+    {"reallocated_sectors", kEvents, Course::Lifetime, "attribute 5", "reallocated sectors"},
+    {"pending_sectors", kEvents, Course::Gauge, "attribute 197",
+     "unstable sectors that wait for reallocation"},
+    {"crc_errors", kEvents, Course::Lifetime, "attribute 199", "errors of the cable"},
+    {"failing_attributes", kEvents, Course::Gauge, "all attributes",
+     "pre-failure attributes at or below their thresholds"},
+};
+constexpr std::uint64_t kMillisecondsPerHour = 3'600'000;
+constexpr std::uint64_t kZeroCelsius = 273'150;
+
+struct Collected {
+  Figures figures;
+  std::int64_t failing = 0;
+
+  void add(Row row, std::uint64_t value) {
+    constexpr std::uint64_t kLargest = std::numeric_limits<std::int64_t>::max();
+    figures.push_back({&kKinds[row], static_cast<std::int64_t>(std::min(value, kLargest))});
+  }
+};
+
+void takeAttribute(SkDisk*, const SkSmartAttributeParsedData* attribute, void* target) {
+  Collected& collected = *static_cast<Collected*>(target);
+  if (attribute->prefailure && attribute->good_now_valid && !attribute->good_now) {
+    ++collected.failing;
+  }
+  if (attribute->pretty_unit != SK_SMART_ATTRIBUTE_UNIT_SECTORS &&
+      attribute->pretty_unit != SK_SMART_ATTRIBUTE_UNIT_NONE) {
+    return;
+  }
+  if (attribute->id == 5) collected.add(kReallocated, attribute->pretty_value);
+  if (attribute->id == 197) collected.add(kPending, attribute->pretty_value);
+  if (attribute->id == 199) collected.add(kCrcErrors, attribute->pretty_value);
+}
+
+}  // namespace
+
+std::span<const FigureKind> ataKinds() {
+  return kKinds;
+}
+
+Expected<Figures> ataFigures(ByteSpan blob) {
+  SkDisk* opened = nullptr;
+  if (sk_disk_open(nullptr, &opened) != 0) return Error{"cannot take SMART data apart"};
+  const std::unique_ptr<SkDisk, decltype(&sk_disk_free)> disk(opened, &sk_disk_free);
+  Collected collected;
+  if (sk_disk_set_blob(opened, blob.data(), blob.size()) != 0 ||
+      sk_disk_smart_parse_attributes(opened, &takeAttribute, &collected) != 0) {
+    return Error{"SMART data is malformed"};
+  }
+  SkBool good = FALSE;
+  if (sk_disk_smart_status(opened, &good) == 0) collected.add(kGood, good ? 1U : 0U);
+  std::uint64_t value = 0;
+  if (sk_disk_smart_get_temperature(opened, &value) == 0 && value >= kZeroCelsius) {
+    collected.add(kTemperature, value - kZeroCelsius);
+  }
+  if (sk_disk_smart_get_power_on(opened, &value) == 0) {
+    collected.add(kPowerOn, value / kMillisecondsPerHour);
+  }
+  if (sk_disk_smart_get_power_cycle(opened, &value) == 0) collected.add(kPowerCycles, value);
+  if (sk_disk_smart_get_bad(opened, &value) == 0) collected.add(kBad, value);
+  collected.add(kFailing, static_cast<std::uint64_t>(collected.failing));
+  return std::move(collected.figures);
+}
+
+}  // namespace tavrel::health

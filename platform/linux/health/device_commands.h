@@ -1,0 +1,32 @@
+// Commands to drives. An interface, so that tests can answer in place of hardware.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "base/expected.h"
+
+namespace tavrel::health {
+
+class DeviceCommands {
+ public:
+  using Bytes = std::vector<std::byte>;
+  virtual ~DeviceCommands() = default;
+
+  /// A log page of the controller whose device file is `path`. Needs CAP_SYS_ADMIN.
+  virtual Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) = 0;
+  /// The register of the whole card, not of a partition. Needs CAP_SYS_RAWIO.
+  virtual Expected<Bytes> extCsd(const std::string& path) = 0;
+  /// SMART data as a blob of libatasmart; nothing inside when the disk's platters stand still.
+  virtual Expected<Bytes> ataSmart(const std::string& path) = 0;
+};
+
+class LinuxDeviceCommands final : public DeviceCommands {
+ public:
+  Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) override;
+  Expected<Bytes> extCsd(const std::string& path) override;
+  Expected<Bytes> ataSmart(const std::string& path) override;
+};
+
+}  // namespace tavrel::health

@@ -1,0 +1,42 @@
+#include "platform/linux/health/mtd_ubi.h"
+
+namespace tavrel::health {
+namespace {
+
+constexpr FigureKind kMtd[] = {
+    {"page_size", kBytes, Course::Gauge, "writesize", "smallest unit of writing"},
+    {"block_size", kBytes, Course::Gauge, "erasesize", "smallest unit of erasing"},
+    {"bad_blocks", kEvents, Course::Gauge, "bad_blocks", "factory and grown bad blocks"},
+    {"reserved_blocks", kEvents, Course::Gauge, "bbt_blocks",
+     "blocks that hold the table of bad blocks"},
+    {"ecc_failures", kEvents, Course::Attached, "ecc_failures", "uncorrectable reads"},
+    {"corrected_bits", kEvents, Course::Attached, "corrected_bits", "bits corrected"},
+};
+constexpr FigureKind kUbi[] = {
+    {"erases_max", kEvents, Course::Lifetime, "max_ec", "erasures of the most used block"},
+    {"bad_blocks", kEvents, Course::Gauge, "bad_peb_count", "bad physical blocks"},
+    {"bad_block_reserve", kEvents, Course::Gauge, "reserved_for_bad",
+     "blocks kept for those that go bad"},
+    {"blocks", kEvents, Course::Gauge, "total_eraseblocks", "logical blocks"},
+    {"free_blocks", kEvents, Course::Gauge, "avail_eraseblocks", "logical blocks not allocated"},
+};
+
+}  // namespace
+
+std::span<const FigureKind> mtdKinds() {
+  return kMtd;
+}
+std::span<const FigureKind> ubiKinds() {
+  return kUbi;
+}
+
+Figures attributeFigures(const std::string& folder, std::span<const FigureKind> kinds) {
+  Figures figures;
+  for (const FigureKind& kind : kinds) {
+    const auto value = readNumber(folder + '/' + std::string(kind.source));
+    if (value) figures.push_back({&kind, *value});
+  }
+  return figures;
+}
+
+}  // namespace tavrel::health

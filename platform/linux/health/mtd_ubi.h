@@ -1,0 +1,17 @@
+// Raw flash: MTD devices and the UBI layer over them, whose figures are files of sysfs.
+#pragma once
+
+#include <span>
+
+#include "platform/linux/health/figure.h"
+#include "platform/linux/health/sysfs.h"
+
+namespace tavrel::health {
+
+std::span<const FigureKind> mtdKinds();
+std::span<const FigureKind> ubiKinds();
+
+/// The figures of the kinds whose `source` is a file in `folder` with a decimal number.
+Figures attributeFigures(const std::string& folder, std::span<const FigureKind> kinds);
+
+}  // namespace tavrel::health

@@ -1,0 +1,188 @@
+#include "platform/linux/health/reader.h"
+
+#include <algorithm>
+#include <sys/stat.h>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "base/text.h"
+#include "platform/linux/files/digests.h"
+#include "platform/linux/health/ata_smart.h"
+#include "platform/linux/health/flash_life.h"
+#include "platform/linux/health/mtd_ubi.h"
+#include "platform/linux/health/nvme_logs.h"
+#include "platform/linux/health/sysfs.h"
+#include "platform/persisted_state.h"
+#include "platform/plist/coding.h"
+
+namespace tavrel::health {
+namespace {
+
+// By what a drive is known again. A digest, so that the file of memories has no serial number.
+std::string identityOf(const Drive& drive) {
+  const std::string& known = drive.serial.empty() ? drive.name : drive.serial;
+  std::string identity;
+  appendHex(identity,
+            sha256(asBytes(format("%s\n%s\n%s", nameOf(drive.kind), drive.model, known))));
+  return identity;
+}
+
+void take(Expected<Figures> figures, std::string_view from, Reading& reading) {
+  if (figures) {
+    reading.figures = std::move(*figures);
+    reading.from = from;
+  } else {
+    reading.error = figures.error().message;
+  }
+}
+
+}  // namespace
+
+Reading readWithoutCommands(const Drive& drive) {
+  Reading reading = emptyReading(drive);
+  const auto attribute = [&](std::string_view name) {
+    return readAttribute(format("%s/%s", drive.folder, name));
+  };
+  switch (drive.kind) {
+    case DriveKind::Nvme:
+    case DriveKind::Ata:
+      reading.error = "not read yet";
+      return reading;
+    case DriveKind::Emmc:
+      reading.from = "sysfs, as at the card's initialisation";
+      reading.figures = emmcFigures(attribute("life_time"), attribute("pre_eol_info"));
+      break;
+    case DriveKind::Ufs:
+      if (isAsleep(drive.folder)) {
+        reading.error = "asleep";
+        return reading;
+      }
+      reading.from = "health_descriptor";
+      reading.figures = ufsFigures(attribute("health_descriptor/life_time_estimation_a"),
+                                   attribute("health_descriptor/life_time_estimation_b"),
+                                   attribute("health_descriptor/eol_info"));
+      break;
+    case DriveKind::Mtd:
+      reading.from = "sysfs";
+      reading.figures = attributeFigures(drive.folder, mtdKinds());
+      break;
+    case DriveKind::Ubi:
+      reading.from = "sysfs";
+      reading.figures = attributeFigures(drive.folder, ubiKinds());
+      break;
+  }
+  if (reading.figures.empty()) reading.error = "tells no health";
+  return reading;
+}
+
+void HealthReader::readNvme(const Drive& drive, Memory& memory, Reading& reading) {
+  const auto page = commands_.nvmeLog(drive.deviceFile, kNvmeSmartLog);
+  take(page ? nvmeSmartFigures(*page) : page.error(), "log 02h", reading);
+  if (!page) return;
+  const std::string key = drive.model + '/' + drive.firmware;
+  const auto known = memory.hasOcpLog.find(key);
+  // A drive that lacks the log counts each question among its errors.
+  if (known != memory.hasOcpLog.end() && !known->second) return;
+  const auto ocpPage = commands_.nvmeLog(drive.deviceFile, kNvmeOcpLog);
+  const auto ocp = ocpPage ? nvmeOcpFigures(*ocpPage) : ocpPage.error();
+  if (known == memory.hasOcpLog.end()) memory.hasOcpLog[key] = static_cast<bool>(ocp);
+  if (!ocp) return;
+  reading.figures.insert(reading.figures.end(), ocp->begin(), ocp->end());
+  appendNvmeDerived(reading.figures);
+  reading.from += ", log C0h";
+}
+
+Reading HealthReader::readDrive(const Drive& drive, Memory& memory, bool& isDriveAsleep) {
+  isDriveAsleep = isAsleep(drive.folder);
+  Reading reading = emptyReading(drive);
+  if (isDriveAsleep) return reading;
+  if (drive.kind == DriveKind::Nvme) {
+    readNvme(drive, memory, reading);
+  } else if (drive.kind == DriveKind::Ata) {
+    const auto blob = commands_.ataSmart(drive.deviceFile);
+    isDriveAsleep = blob && blob->empty();
+    if (!isDriveAsleep) take(blob ? ataFigures(*blob) : blob.error(), "ATA SMART", reading);
+  } else {
+    if (drive.kind == DriveKind::Emmc) {
+      const auto extCsd = commands_.extCsd(drive.deviceFile);
+      take(extCsd ? emmcFigures(*extCsd) : extCsd.error(), "EXT_CSD, from the card", reading);
+    }
+    // A card that may not be asked still has what the kernel read.
+    if (reading.from.empty()) reading = readWithoutCommands(drive);
+  }
+  return reading;
+}
+
+Memory HealthReader::loadMemory() {
+  const std::string path = root_.path(kMemoryFile);
+  const auto content = files_.readIfPresent(path, limits::kHealthMemoryBytes);
+  if (content && !*content) return {};
+  auto memory = content ? decodeMemory(asBytes(**content)) : Expected<Memory>(content.error());
+  if (memory) return std::move(*memory);
+  log_.log(LogLevel::Error, "cannot use remembered counters %s, beginning anew: %s", path,
+           memory.error().message);
+  return {};
+}
+
+// Growth counts from the reading that the last daily run saw, so the daemon's note of its last run
+// says when to begin anew.
+std::optional<std::int64_t> HealthReader::lastRunDay() {
+  const std::string path =
+      root_.path(format("/var/mobile/Library/Preferences/%s.plist", kTavrelDomain));
+  const auto content = files_.readIfPresent(path, limits::kPreferenceFileBytes);
+  if (!content || !*content) return std::nullopt;
+  const auto state = plist::read(asBytes(**content));
+  if (!state) return std::nullopt;
+  const auto day = state->dictionary().number(kLastRunDayKey);
+  return day ? std::optional(day->int64()) : std::nullopt;
+}
+
+bool HealthReader::write(const Reading& reading) {
+  const std::string path = root_.path(format("%s/%s.plist", kReadingsFolder, reading.name));
+  const auto document = encodeReading(reading);
+  const Status written =
+      document ? files_.replace(path, asBytes(*document), 0644) : Status(document.error());
+  if (!written) log_.log(LogLevel::Error, "%s", written.error().message);
+  return static_cast<bool>(written);
+}
+
+bool HealthReader::removeGone(const std::vector<Drive>& drives) {
+  const std::string folder = root_.path(kReadingsFolder);
+  const auto names = files_.list(folder);
+  if (!names) return false;
+  for (const std::string& name : *names) {
+    const bool isThere = std::ranges::any_of(
+        drives, [&](const Drive& drive) { return drive.name + ".plist" == name; });
+    if (!isThere) files_.discard(folder + '/' + name);
+  }
+  return true;
+}
+
+bool HealthReader::readAll(std::int64_t nowSeconds) {
+  const std::vector<Drive> drives = findDrives(Machine(root_));
+  const Moment moment{nowSeconds, bootIDOf(root_), lastRunDay()};
+  Memory memory = loadMemory();
+  bool isDone = true;
+  for (const Drive& drive : drives) {
+    bool isDriveAsleep = false;
+    Reading reading = readDrive(drive, memory, isDriveAsleep);
+    if (isDriveAsleep) continue;
+    reading.time = moment.seconds;
+    reading.boot = moment.boot;
+    if (!reading.error.empty()) {
+      log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
+    } else {
+      reading.growth = takeGrowth(memory.drives[identityOf(drive)], reading.figures, moment);
+    }
+    isDone = write(reading) && isDone;
+  }
+  isDone = removeGone(drives) && isDone;
+  memory.forgetOld(moment.seconds);
+  const auto document = encodeMemory(memory);
+  const Status kept = document ? files_.replace(root_.path(kMemoryFile), asBytes(*document), 0600)
+                               : Status(document.error());
+  if (!kept) log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
+  return isDone && kept;
+}
+
+}  // namespace tavrel::health

@@ -1,0 +1,49 @@
+// Reads all drives of the machine and leaves their readings for everybody.
+#pragma once
+
+#include <optional>
+#include <string_view>
+
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/health/device_commands.h"
+#include "platform/linux/health/drives.h"
+#include "platform/linux/health/growth.h"
+#include "platform/linux/health/reading.h"
+#include "platform/system_log.h"
+
+namespace tavrel::health {
+
+/// Remembered counters, and which drives have the OCP log. Only root may read it.
+inline constexpr std::string_view kMemoryFile = "/var/lib/tavrel/health/memory.plist";
+
+/// Figures that take no command to the drive, for kinds that tell any that way. The reading's
+/// error is set when the drive sleeps or shows nothing.
+Reading readWithoutCommands(const Drive& drive);
+
+class HealthReader {
+ public:
+  /// All must outlive the reader.
+  HealthReader(const DeviceRoot& root, FileSystem& files, DeviceCommands& commands, SystemLog& log)
+      : root_(root), files_(files), commands_(commands), log_(log) {}
+
+  /// False when a reading or the memory could not be written. A drive that sleeps keeps its earlier
+  /// reading; that of a drive that has gone is removed; one that cannot be read has a reading that
+  /// says why.
+  bool readAll(std::int64_t nowSeconds);
+
+ private:
+  Memory loadMemory();
+  std::optional<std::int64_t> lastRunDay();
+  Reading readDrive(const Drive& drive, Memory& memory, bool& isAsleep);
+  void readNvme(const Drive& drive, Memory& memory, Reading& reading);
+  bool write(const Reading& reading);
+  bool removeGone(const std::vector<Drive>& drives);
+
+  const DeviceRoot& root_;
+  FileSystem& files_;
+  DeviceCommands& commands_;
+  SystemLog& log_;
+};
+
+}  // namespace tavrel::health

@@ -1,0 +1,91 @@
+#include "platform/linux/health/sysfs.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <cstdlib>
+#include <fcntl.h>
+#include <filesystem>
+#include <memory>
+#include <sys/stat.h>
+#include <system_error>
+
+#include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/line_reader.h"
+
+namespace tavrel::health {
+namespace {
+
+constexpr std::size_t kLabelBytes = 64;
+
+}  // namespace
+
+std::optional<std::string> readAttribute(const std::string& path) {
+  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
+  struct stat status {};
+  if (!file || fstat(file.get(), &status) != 0 || !S_ISREG(status.st_mode)) return std::nullopt;
+  std::array<char, 4096> buffer{};
+  const ssize_t size = read(file.get(), buffer.data(), buffer.size());
+  if (size <= 0) return std::nullopt;
+  const std::string_view text =
+      trimmed(std::string_view(buffer.data(), static_cast<std::size_t>(size)));
+  const std::size_t end = text.find_last_not_of('\n');
+  if (end == std::string_view::npos) return std::nullopt;
+  return std::string(trimmed(text.substr(0, end + 1)));
+}
+
+std::optional<std::int64_t> decimalOf(std::string_view text) {
+  std::int64_t value = 0;
+  const char* const end = text.data() + text.size();
+  const auto [stop, fault] = std::from_chars(text.data(), end, value);
+  if (fault != std::errc() || stop != end || value < 0) return std::nullopt;
+  return value;
+}
+
+std::optional<std::int64_t> readNumber(const std::string& path) {
+  const auto text = readAttribute(path);
+  return text ? decimalOf(*text) : std::nullopt;
+}
+
+std::string readLabel(const std::string& path) {
+  std::string label = readAttribute(path).value_or("");
+  label.resize(std::min(label.size(), kLabelBytes));
+  std::ranges::replace_if(
+      label, [](char c) { return c < ' ' || c > '~'; }, '?');
+  return label;
+}
+
+std::vector<std::string> namesIn(const std::string& folder) {
+  std::vector<std::string> names;
+  std::error_code fault;
+  for (std::filesystem::directory_iterator at(folder, fault), end; !fault && at != end;
+       at.increment(fault))
+    names.push_back(at->path().filename());
+  std::ranges::sort(names, [](const std::string& a, const std::string& b) {
+    return a.size() != b.size() ? a.size() < b.size() : a < b;
+  });
+  return names;
+}
+
+bool isNumbered(std::string_view name, std::string_view prefix) {
+  if (!name.starts_with(prefix) || name.size() == prefix.size()) return false;
+  return name.find_first_not_of("0123456789", prefix.size()) == std::string_view::npos;
+}
+
+std::string resolved(const std::string& path) {
+  const std::unique_ptr<char, decltype(&std::free)> real(realpath(path.c_str(), nullptr),
+                                                         &std::free);
+  return real ? std::string(real.get()) : std::string();
+}
+
+bool isAsleep(const std::string& path) {
+  std::string folder = resolved(path);
+  while (!folder.empty() && !folder.ends_with("/devices")) {
+    const auto status = readAttribute(folder + "/power/runtime_status");
+    if (status && (*status == "suspended" || *status == "suspending")) return true;
+    folder.resize(folder.find_last_of('/'));
+  }
+  return false;
+}
+
+}  // namespace tavrel::health

@@ -1,0 +1,299 @@
+// Health of drives: log pages, texts of sysfs, growth, and whole readings below a device root.
+#include <filesystem>
+#include <gtest/gtest.h>
+
+#include "platform/linux/health/flash_life.h"
+#include "platform/linux/health/nvme_logs.h"
+#include "platform/linux/health/reader.h"
+#include "platform/linux/health/verdict.h"
+#include "platform/persisted_state.h"
+#include "platform/plist/xml.h"
+#include "temporary_root.h"
+
+namespace tavrel::health {
+namespace {
+
+using Bytes = DeviceCommands::Bytes;
+using Values = std::map<std::string, std::int64_t>;
+constexpr std::int64_t kMost = INT64_MAX;
+
+Values valuesOf(const Figures& figures) {
+  Values values;
+  for (const Figure& figure : figures)
+    values.emplace(figure.kind->name, figure.value);
+  return values;
+}
+
+void put(Bytes& bytes, std::size_t offset, const std::vector<unsigned>& values) {
+  for (const unsigned value : values)
+    bytes[offset++] = static_cast<std::byte>(value);
+}
+
+Bytes smartPage() {
+  Bytes page(512);
+  put(page, 0, {4, 0x43, 0x01, 90, 10, 255});  // 323 K, 255 % used
+  put(page, 48, {2});
+  put(page, 80, {7});
+  put(page, 112, std::vector<unsigned>(16, 255));
+  put(page, 128, {1, 0, 0, 0, 0, 0, 0, 0, 1});  // 2^64 + 1 hours
+  put(page, 144, {0, 0, 0, 0, 0, 0, 0, 0x80});  // 2^63
+  return page;
+}
+
+Bytes ocpPage() {
+  Bytes page(512);
+  put(page, 0, {0x00, 0xA0, 0x0F});  // 1,024,000
+  put(page, 32, std::vector<unsigned>(6, 255));
+  put(page, 40, {3});
+  put(page, 96, {255});
+  put(page, 496,
+      {0xC5, 0xAF, 0x10, 0x28, 0xEA, 0xBF, 0xF2, 0xA4, 0x9C, 0x4F, 0x6F, 0x7C, 0xC9, 0x14, 0xD5,
+       0xAF});
+  return page;
+}
+
+TEST(HealthTest, NvmeSmartLog) {
+  const auto values = valuesOf(*nvmeSmartFigures(smartPage()));
+  const Values expected = {
+      {"critical_warning", 4},     {"temperature", 49'850},     {"spare_pct", 90},
+      {"spare_threshold_pct", 10}, {"used_pct", 255},           {"written", 1'024'000},
+      {"read_commands", 0},        {"write_commands", 7},       {"busy_minutes", 0},
+      {"power_on_hours", kMost},   {"unsafe_shutdowns", kMost}, {"media_errors", 0},
+      {"error_log_entries", 0},    {"warning_temp_minutes", 0}, {"critical_temp_minutes", 0},
+      {"throttle_light", 0},       {"throttle_heavy", 0}};
+  EXPECT_EQ(values, expected);  // no "read" (0 units), no "power_cycles" (all ones)
+}
+
+TEST(HealthTest, RefusesShortAndLyingLogs) {
+  EXPECT_EQ(nvmeSmartFigures(Bytes(511)).error().message, "log 02h has 511 bytes instead of 512");
+  EXPECT_EQ(nvmeSmartFigures(Bytes(512)).error().message, "log 02h is blank");
+  EXPECT_EQ(nvmeSmartFigures(Bytes(512, std::byte{255})).error().message, "log 02h is blank");
+  EXPECT_EQ(nvmeOcpFigures(smartPage()).error().message, "log C0h is not the one of OCP");
+  Bytes page = smartPage();
+  put(page, 3, {101});  // more spare than there is
+  EXPECT_FALSE(valuesOf(*nvmeSmartFigures(page)).contains("spare_pct"));
+  EXPECT_EQ(emmcFigures(Bytes(100)).error().message, "EXT_CSD has 100 bytes instead of 512");
+  Bytes card(512);
+  put(card, 192, {6});
+  EXPECT_EQ(emmcFigures(card).error().message,
+            "EXT_CSD revision 6, before eMMC 5.0, has no health");
+}
+
+TEST(HealthTest, FlashLife) {
+  Bytes card(512);
+  put(card, 192, {8});
+  put(card, 267, {2, 11, 0});
+  EXPECT_EQ(valuesOf(*emmcFigures(card)), (Values{{"life_a_pct", 110}, {"pre_eol", 2}}));
+  struct Case {
+    std::optional<std::string_view> life, preEol;
+    Values values;
+  };
+  const Case cases[] = {
+      {"0x01 0x02", "0x01", {{"life_a_pct", 10}, {"life_b_pct", 20}, {"pre_eol", 1}}},
+      {"0x0b 0x00", "03", {{"life_a_pct", 110}, {"pre_eol", 3}}},
+      {"0x0C", "0x04", {}},
+      {"zz 0x02", "", {}},
+      {"0x01x 0x02", std::nullopt, {}},
+      {std::nullopt, "0xFFFFFFFFFF", {}}};
+  for (const Case& each : cases)
+    EXPECT_EQ(valuesOf(emmcFigures(each.life, each.preEol)), each.values);
+  EXPECT_EQ(valuesOf(ufsFigures("0x03", "0x0A", "0x01")),
+            (Values{{"life_a_pct", 30}, {"life_b_pct", 100}, {"pre_eol", 1}}));
+}
+
+TEST(HealthTest, Growth) {
+  struct Step {
+    std::string boot;
+    std::int64_t runDay, written, ecc;  // bytes, failures since attach
+    Values growth;
+  };
+  const std::vector<std::pair<std::string, std::vector<Step>>> cases = {
+      {"counts from the reading that the run saw",
+       {{"a", 1, 10, 0, {}},
+        {"a", 1, 15, 1, {}},
+        {"a", 2, 18, 1, {{"written", 3}, {"ecc_failures", 0}}},
+        {"a", 2, 20, 4, {{"written", 5}, {"ecc_failures", 3}}},
+        {"a", 3, 21, 4, {{"written", 1}, {"ecc_failures", 0}}}}},
+      {"a new boot begins the kernel's counter at 0, not the drive's",
+       {{"a", 1, 10, 5, {}},
+        {"b", 2, 12, 7, {{"written", 2}, {"ecc_failures", 7}}},
+        {"b", 2, 12, 2, {{"written", 2}, {"ecc_failures", 9}}}}},
+      {"a counter that went back is unknown until the next run",
+       {{"a", 1, 10, 0, {}},
+        {"a", 2, 4, 0, {{"ecc_failures", 0}}},
+        {"a", 2, 9, 0, {{"ecc_failures", 0}}},
+        {"a", 3, 11, 0, {{"written", 2}, {"ecc_failures", 0}}}}},
+      {"growth saturates",
+       {{"a", 1, 0, kMost, {}},
+        {"b", 2, kMost, kMost, {{"written", kMost}, {"ecc_failures", kMost}}},
+        {"c", 2, kMost, 1, {{"written", kMost}, {"ecc_failures", kMost}}}}}};
+  const FigureKind* const written = figureKind(DriveKind::Nvme, "written");
+  const FigureKind* const ecc = figureKind(DriveKind::Mtd, "ecc_failures");
+  for (const auto& [what, steps] : cases) {
+    Memory memory;
+    for (const Step& step : steps) {
+      const Figures growth =
+          takeGrowth(memory.drives["d"], {{written, step.written}, {ecc, step.ecc}},
+                     {1000, step.boot, step.runDay});
+      EXPECT_EQ(valuesOf(growth), step.growth) << what << ", written " << step.written;
+      memory = *decodeMemory(asBytes(*encodeMemory(memory)));
+    }
+  }
+}
+
+class Answers final : public DeviceCommands {
+ public:
+  Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) override {
+    asked.push_back(path.substr(path.rfind('/') + 1) + (page == kNvmeSmartLog ? " 02" : " C0"));
+    const auto& answer = page == kNvmeSmartLog ? smart : ocp;
+    if (!answer) return Error{"NVMe status 0x4002"};
+    return *answer;
+  }
+  Expected<Bytes> extCsd(const std::string&) override { return Error{"not permitted"}; }
+  Expected<Bytes> ataSmart(const std::string&) override { return Bytes{}; }
+
+  std::optional<Bytes> smart = smartPage(), ocp;
+  std::vector<std::string> asked;
+};
+
+class HealthReaderTest : public testing::Test, protected TemporaryRoot {
+ protected:
+  void addNvme(const std::string& name, const std::string& serial) const {
+    const std::string folder = "/sys/devices/pci/" + name;
+    write(folder + "/model", "Disk\n");
+    write(folder + "/firmware_rev", "1.0\n");
+    write(folder + "/serial", serial);
+    write(folder + "/" + name + "n1/size", "2048\n");
+    std::filesystem::create_directories(root.path("/sys/class/nvme"));
+    std::filesystem::create_directory_symlink(root.path(folder),
+                                              root.path("/sys/class/nvme/" + name));
+  }
+  bool readAll(std::int64_t now) { return HealthReader(root, files, answers, log).readAll(now); }
+  std::map<std::string, Reading> readings() {
+    std::map<std::string, Reading> byName;
+    for (Reading& reading : loadReadings(root, files).readings)
+      byName.emplace(reading.name, reading);
+    return byName;
+  }
+
+  FileSystem files;
+  KeptLog log;
+  Answers answers;
+};
+
+TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
+  addNvme("nvme0", "S1");
+  write("/sys/block/mmcblk0/device/type", "MMC\n");
+  write("/sys/block/mmcblk0/device/life_time", "0x02 0x01\n");
+  write("/sys/class/mtd/mtd0/ecc_failures", "2\n");
+  write("/sys/class/mtd/mtd0/corrected_bits", "-\n");
+  write("/sys/class/ubi/ubi0/max_ec", "9\n");
+  ASSERT_TRUE(readAll(1000));
+  auto all = readings();
+  ASSERT_EQ(all.size(), 4U);
+  EXPECT_EQ(all["nvme0"].capacity, 2048 * 512);
+  EXPECT_EQ(all["nvme0"].time, 1000);
+  EXPECT_EQ(valuesOf(all["nvme0"].figures)["written"], 1'024'000);
+  EXPECT_EQ(valuesOf(all["mmcblk0"].figures), (Values{{"life_a_pct", 20}, {"life_b_pct", 10}}));
+  EXPECT_EQ(all["mmcblk0"].from, "sysfs, as at the card's initialisation");
+  EXPECT_EQ(valuesOf(all["mtd0"].figures), (Values{{"ecc_failures", 2}}));
+  const auto named = figuresOf({all["ubi0"]});
+  ASSERT_EQ(named.size(), 1U);
+  EXPECT_EQ(named[0].name, "ubi0.erases_max");
+  EXPECT_EQ(named[0].value, 9);
+  EXPECT_EQ(contentOf(root.path("/run/tavrel/health/nvme0.plist")).find("S1"), std::string::npos);
+}
+
+TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
+  addNvme("nvme0", "S1");
+  addNvme("nvme1", "S2");
+  ASSERT_TRUE(readAll(1000) && readAll(2000));
+  const std::vector<std::string> expected = {"nvme0 02", "nvme0 C0", "nvme1 02", "nvme0 02",
+                                             "nvme1 02"};
+  EXPECT_EQ(answers.asked, expected);
+  write("/sys/devices/pci/nvme1/firmware_rev", "1.1");
+  answers.ocp = ocpPage();
+  ASSERT_TRUE(readAll(3000));
+  auto figures = valuesOf(readings()["nvme1"].figures);
+  EXPECT_EQ(figures["media_written"], 1'024'000);
+  EXPECT_EQ(figures["waf_milli"], 1000);
+  EXPECT_EQ(figures["throttle_events"], 255);
+  EXPECT_FALSE(figures.contains("bad_user_blocks"));
+  EXPECT_FALSE(valuesOf(readings()["nvme0"].figures).contains("media_written"));
+}
+
+TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
+  addNvme("nvme0", "S1");
+  const auto run = [&](std::int64_t day) {
+    write("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist",
+          *plist::writeXml(plist::Dictionary{{std::string(kLastRunDayKey), day}}));
+  };
+  run(1);
+  ASSERT_TRUE(readAll(1000));
+  run(2);
+  put(*answers.smart, 48, {5});
+  ASSERT_TRUE(readAll(2000));
+  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 3 * 512'000);
+
+  write("/sys/devices/pci/power/runtime_status", "suspended\n");  // what the drive hangs on
+  answers.asked.clear();
+  ASSERT_TRUE(readAll(3000));
+  EXPECT_TRUE(answers.asked.empty());
+  EXPECT_EQ(readings()["nvme0"].time, 2000);
+
+  write("/sys/devices/pci/power/runtime_status", "active\n");
+  write("/sys/devices/pci/nvme0/serial", "S9");
+  ASSERT_TRUE(readAll(4000));
+  EXPECT_TRUE(readings()["nvme0"].growth.empty());  // another drive
+
+  answers.smart.reset();
+  ASSERT_TRUE(readAll(5000));
+  EXPECT_EQ(readings()["nvme0"].error, "NVMe status 0x4002");
+  EXPECT_TRUE(readings()["nvme0"].figures.empty());
+  std::filesystem::remove(root.path("/sys/class/nvme/nvme0"));
+  ASSERT_TRUE(readAll(6000));
+  EXPECT_TRUE(readings().empty());
+}
+
+TEST(HealthTest, Verdicts) {
+  struct Case {
+    DriveKind kind;
+    Values figures;
+    std::string error;
+    const char* word;
+    int problems;
+  };
+  const Case cases[] = {
+      {DriveKind::Nvme,
+       {{"used_pct", 99}, {"spare_pct", 10}, {"spare_threshold_pct", 10}},
+       "",
+       "good",
+       0},
+      {DriveKind::Nvme, {{"used_pct", 255}}, "", "worn", kWorn},
+      {DriveKind::Nvme, {{"spare_pct", 9}, {"spare_threshold_pct", 10}}, "", "worn", kWorn},
+      {DriveKind::Nvme,
+       {{"critical_warning", 4}, {"media_errors", 1}},
+       "",
+       "failing",
+       kFailing | kErrors},
+      {DriveKind::Ata, {{"smart_good", 0}}, "", "failing", kFailing},
+      {DriveKind::Emmc, {{"pre_eol", 3}}, "", "failing", kFailing | kWorn},
+      {DriveKind::Nvme, {}, "no", "unknown", kUnread}};
+  for (const Case& each : cases) {
+    Reading reading;
+    reading.kind = each.kind;
+    reading.error = each.error;
+    reading.time = 1000;
+    reading.boot = "a";
+    for (const auto& [name, value] : each.figures)
+      reading.figures.push_back({figureKind(each.kind, name), value});
+    const Verdict verdict = judge(reading, 1000, "a");
+    EXPECT_STREQ(verdict.word(), each.word);
+    EXPECT_EQ(int{verdict.problems}, each.problems);
+    EXPECT_EQ(judge(reading, 1000, "b").problems, each.problems | kOld);
+    EXPECT_EQ(judge(reading, 1001 + 2 * 86'400, "a").problems, each.problems | kOld);
+  }
+}
+
+}  // namespace
+}  // namespace tavrel::health

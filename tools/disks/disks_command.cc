@@ -1,0 +1,222 @@
+#include "tools/disks/disks_command.h"
+
+#include <algorithm>
+#include <initializer_list>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "base/arithmetic.h"
+#include "base/format.h"
+#include "base/text.h"
+#include "platform/linux/health/drives.h"
+#include "platform/linux/health/reader.h"
+#include "platform/linux/health/verdict.h"
+#include "platform/linux/linux_platform.h"
+#include "tools/shared/quantity_text.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+using namespace health;
+
+struct Disk {
+  Reading reading;
+  Verdict verdict;
+  std::int64_t age = 0;  // seconds
+};
+
+/// Every drive of the machine, and those that only have a reading.
+std::vector<Disk> findDisks(ToolContext& context) {
+  auto [readings, faults] = loadReadings(context.root(), context.linuxPlatform().fileSystem());
+  for (const Error& fault : faults)
+    context.fail(fault.message);
+  const std::int64_t now = saturatingInt64(context.platform().clock->now().secondsSince1970());
+  const std::string boot = bootIDOf(context.root());
+  for (const Drive& drive : findDrives(Machine(context.root()))) {
+    const bool isRead = std::ranges::any_of(
+        readings, [&](const Reading& reading) { return reading.name == drive.name; });
+    if (isRead) continue;
+    readings.push_back(readWithoutCommands(drive));
+    readings.back().time = now;
+  }
+  std::ranges::stable_sort(readings, {}, &Reading::kind);
+  std::vector<Disk> disks;
+  for (Reading& reading : readings) {
+    Verdict verdict = judge(reading, now, boot);
+    const std::int64_t age = std::max<std::int64_t>(now - reading.time, 0);
+    disks.push_back({std::move(reading), std::move(verdict), age});
+  }
+  return disks;
+}
+
+// The first of the named figures that the drive tells.
+const std::int64_t* firstOf(const Disk& disk, std::initializer_list<std::string_view> names) {
+  for (const std::string_view name : names) {
+    if (const std::int64_t* const value = valueOf(disk.reading.figures, name)) return value;
+  }
+  return nullptr;
+}
+
+std::string percentOf(const Disk& disk, std::initializer_list<std::string_view> names) {
+  const std::int64_t* const value = firstOf(disk, names);
+  return value ? format("%lld %%", *value) : "-";
+}
+
+std::string bytesOf(const Disk& disk, std::string_view name) {
+  const std::int64_t* const value = firstOf(disk, {name});
+  return value ? sizeText(static_cast<double>(*value)) : "-";
+}
+
+std::string valueText(Unit unit, std::int64_t value) {
+  if (unit == kBytes) return sizeText(static_cast<double>(value));
+  if (unit == kMillidegrees) return format("%.1f °C", static_cast<double>(value) / 1000);
+  return std::to_string(value);
+}
+
+const char* unitName(Unit unit) {
+  if (unit == kBytes) return "B";
+  if (unit == kMillidegrees) return "mC";
+  return unit == kEvents ? "events" : "";
+}
+
+std::string ageText(std::int64_t seconds) {
+  if (seconds < 120) return format("%lld s", seconds);
+  if (seconds < 2 * 3600) return format("%lld min", seconds / 60);
+  return seconds < 2 * 86'400 ? format("%lld h", seconds / 3600)
+                              : format("%lld days", seconds / 86'400);
+}
+
+Emphasis emphasisOf(const Verdict& verdict) {
+  return verdict.problems == 0 ? Emphasis::None : Emphasis::Alarm;
+}
+
+void printTable(ToolContext& context, const std::vector<Disk>& disks) {
+  constexpr auto kRight = Table::Align::Right;
+  Table table({{"DISK", Table::Align::Whole},
+               {"MODEL"},
+               {"FIRMWARE"},
+               {"SIZE", kRight},
+               {"WEAR", kRight},
+               {"SPARE", kRight},
+               {"TEMP", kRight},
+               {"WRITTEN", kRight},
+               {"READ", kRight},
+               {"ERRORS", kRight},
+               {"HOURS ON", kRight},
+               {"AGE", kRight},
+               {"VERDICT", Table::Align::Whole}});
+  const auto count = [](const std::int64_t* value) {
+    return value ? std::to_string(*value) : std::string("-");
+  };
+  for (const Disk& disk : disks) {
+    const Reading& reading = disk.reading;
+    const std::int64_t* const temperature = firstOf(disk, {"temperature"});
+    table.add({reading.name,
+               reading.model,
+               reading.firmware,
+               reading.capacity ? sizeText(static_cast<double>(*reading.capacity)) : "-",
+               percentOf(disk, {"used_pct", "life_a_pct", "life_b_pct"}),
+               percentOf(disk, {"spare_pct"}),
+               temperature ? valueText(kMillidegrees, *temperature) : "-",
+               bytesOf(disk, "written"),
+               bytesOf(disk, "read"),
+               count(firstOf(disk, {"media_errors", "bad_sectors", "ecc_failures"})),
+               count(firstOf(disk, {"power_on_hours"})),
+               ageText(disk.age),
+               {disk.verdict.word(), emphasisOf(disk.verdict)}});
+  }
+  table.print(context.page());
+  for (const Disk& disk : disks) {
+    for (const std::string& reason : disk.verdict.reasons)
+      context.out() << disk.reading.name << ": " << printable(reason) << '\n';
+  }
+}
+
+void printFigures(ToolContext& context, const std::vector<Disk>& disks) {
+  for (const Disk& disk : disks) {
+    const std::string from =
+        disk.reading.from.empty() ? std::string() : "  from " + disk.reading.from;
+    context.out() << '\n' << disk.reading.name << printable(from) << '\n';
+    Table table({{""}, {"", Table::Align::Right}, {""}, {""}}, 2);
+    for (const NamedFigure& figure : figuresOf({disk.reading})) {
+      table.add({figure.name, valueText(figure.unit, figure.value), std::string(figure.source),
+                 std::string(figure.meaning)});
+    }
+    table.print(context.page());
+  }
+}
+
+Json jsonOf(const Figures& figures) {
+  Json json = Json::object();
+  for (const Figure& figure : figures)
+    json[std::string(figure.kind->name)] = figure.value;
+  return json;
+}
+
+Json jsonOf(const Disk& disk, bool showsSources) {
+  const Reading& reading = disk.reading;
+  Json json = {{"name", reading.name},
+               {"kind", nameOf(reading.kind)},
+               {"model", reading.model},
+               {"firmware", reading.firmware},
+               {"capacity_bytes", reading.capacity ? Json(*reading.capacity) : Json(nullptr)},
+               {"time", dateText(plist::Date::since1970(static_cast<double>(reading.time)))},
+               {"age_seconds", disk.age},
+               {"from", reading.from},
+               {"error", reading.error.empty() ? Json(nullptr) : Json(reading.error)},
+               {"verdict", disk.verdict.word()},
+               {"problems", disk.verdict.problems},
+               {"reasons", disk.verdict.reasons},
+               {"figures", jsonOf(reading.figures)},
+               {"growth", jsonOf(reading.growth)}};
+  if (!showsSources) return json;
+  Json sources = Json::array();
+  for (const NamedFigure& figure : figuresOf({reading})) {
+    sources.push_back({{"name", figure.name},
+                       {"value", figure.value},
+                       {"unit", unitName(figure.unit)},
+                       {"source", figure.source},
+                       {"meaning", figure.meaning}});
+  }
+  json["sources"] = std::move(sources);
+  return json;
+}
+
+void showDisks(ToolContext& context, bool showsSources) {
+  const std::vector<Disk> disks = findDisks(context);
+  int status = context.exitStatus();
+  for (const Disk& disk : disks)
+    status |= disk.verdict.problems;
+  if (context.json()) {
+    Json list = Json::array();
+    for (const Disk& disk : disks)
+      list.push_back(jsonOf(disk, showsSources));
+    context.printJson({{"disks", std::move(list)}});
+  } else if (disks.empty()) {
+    context.out() << "no drive tells its health\n";
+  } else {
+    printTable(context, disks);
+    if (showsSources) printFigures(context, disks);
+  }
+  context.setExitStatus(status);
+}
+
+}  // namespace
+
+void addDisksCommand(Command app, ToolContext& context) {
+  struct Arguments {
+    bool all = false;
+  };
+  const auto arguments = std::make_shared<Arguments>();
+  const Command command = app.addCommand("disks", "Show the health of the drives");
+  command.addFlag("--all", arguments->all, "Also each figure with its source and meaning");
+  context.addJsonOption(command);
+  command.setFooter(
+      "Exit status, the sum of: 1 a reading is unusable; 4 a drive is unread; 8 failing; 16 worn; "
+      "32 has errors; 64 its reading is old. 2 is for usage.");
+  command.onRun([&context, arguments] { showDisks(context, arguments->all); });
+}
+
+}  // namespace tavrel
