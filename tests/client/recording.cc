@@ -1,6 +1,7 @@
 #include "recording.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <cstdlib>
 #include <ctime>
 
@@ -77,9 +78,12 @@ SegmentWriter Recording::writerOf(const std::string& segment) const {
 void Recording::fold() {
   for (const std::string& path : segments()) {
     const Descriptor file(open(path.c_str(), O_RDONLY));
+    // Of threads that begin a segment at once, one keeps its own.
+    if (!file && errno == ENOENT) continue;
     SegmentReader reader(file.get());
     const bool isGone = findSegmentWriter(file.get(), reader.facts()) == SegmentWriter::Gone;
     const auto state = reader.state();
+    ASSERT_TRUE(state) << state.error().message;
     SegmentProgress progress;
     if (*state == SegmentReader::State::Begun) {
       std::string& bytes = positions[path];

@@ -140,6 +140,8 @@ Expected<SegmentReader::State> SegmentReader::state() const {
   if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
   if (!S_ISREG(status.st_mode)) return Error{"not a regular file"};
   const std::uint64_t magic = file_.word64(kBHHeaderMagic);
+  // Asked after the magic: its process gives the file the size before.
+  if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
   if (magic == 0 && (status.st_size == 0 || status.st_size == kBHSegmentBytes)) return State::Empty;
   if (magic != kBHSegmentMagic) return Error{"not a segment"};
   if (const std::uint32_t version = file_.word32(kBHHeaderVersion); version != kBHSegmentVersion) {
