@@ -14,7 +14,7 @@
 namespace tavrel {
 
 struct CollectState {
-  /// CLOCK_MONOTONIC, which starts anew with the machine.
+  /// CLOCK_MONOTONIC, which starts from zero with the machine.
   std::chrono::nanoseconds at{};
   /// Of the reading only the counters are kept.
   MachineReading machine;

@@ -27,7 +27,7 @@ std::string_view nameOf(DriveKind kind);
 enum class Course : std::uint8_t {
   Gauge,     // up and down
   Lifetime,  // a counter that the drive keeps
-  Attached,  // a counter that begins anew when the kernel attaches the drive
+  Attached,  // a counter that starts from zero when the kernel attaches the drive
 };
 
 /// Where a figure stands in a log page, little-endian.

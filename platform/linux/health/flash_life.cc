@@ -30,7 +30,7 @@ constexpr std::size_t kRevision = 192, kPreEolOffset = 267;
 constexpr std::uint8_t kRevisionOf50 = 7;
 constexpr unsigned kLastStep = 11, kLastPreEol = 3;
 
-// The next hexadecimal number of `text`, which is cut behind it.
+// The next hexadecimal number of `text`, which is cut after it.
 std::optional<unsigned> takeNumber(std::string_view& text) {
   text = trimmed(text);
   if (text.starts_with("0x") || text.starts_with("0X")) text.remove_prefix(2);

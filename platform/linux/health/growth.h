@@ -1,10 +1,10 @@
 // How much counters have grown since the previous daily run.
 //
 // The reader remembers each drive by its identity, so that a drive moved to another port goes on
-// counting and a new one in its place begins anew. Between two readings a counter grows by their
-// difference. A counter that the kernel keeps begins at 0 in every boot, or when it goes back. A
-// counter of the drive that goes back has no growth until the next daily run: nobody knows what was
-// lost.
+// counting and a new one in its place starts from zero. Between two readings a counter grows by
+// their difference. A counter that the kernel keeps begins at 0 in every boot, or when it goes
+// back. A counter of the drive that goes back has no growth until the next daily run: nobody knows
+// what was lost.
 #pragma once
 
 #include <cstdint>

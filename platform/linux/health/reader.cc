@@ -119,13 +119,13 @@ Memory HealthReader::loadMemory() {
   if (content && !*content) return {};
   auto memory = content ? decodeMemory(asBytes(**content)) : Expected<Memory>(content.error());
   if (memory) return std::move(*memory);
-  log_.log(LogLevel::Error, "cannot use remembered counters %s, beginning anew: %s", path,
+  log_.log(LogLevel::Error, "cannot use remembered counters %s, starting again: %s", path,
            memory.error().message);
   return {};
 }
 
 // Growth counts from the reading that the last daily run saw, so the daemon's note of its last run
-// says when to begin anew.
+// says when to start again.
 std::optional<std::int64_t> HealthReader::lastRunDay() {
   const std::string path =
       root_.path(format("/var/mobile/Library/Preferences/%s.plist", kTavrelDomain));

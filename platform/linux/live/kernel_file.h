@@ -53,7 +53,7 @@ class KernelFile {
   const std::string& path() const { return path_; }
 
   /// The text as it is now, in `buffer`. Reads through the descriptor of the reading before when
-  /// the budget had one; a file that has meanwhile been made anew is opened again.
+  /// the budget had one; a file that has meanwhile been replaced is opened again.
   std::optional<std::string_view> read(DescriptorBudget& budget, TextBuffer& buffer);
 
  private:

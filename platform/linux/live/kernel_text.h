@@ -21,7 +21,7 @@ struct Scale {
   std::int64_t divide = 1;
 };
 
-/// A number in decimal or, with 0x, hexadecimal; blanks around it and decimals behind it do not
+/// A number in decimal or, with 0x, hexadecimal; blanks around it and decimals after it do not
 /// count. Nothing for other text. Numbers beyond 64 bits with a sign are the largest one.
 std::optional<std::int64_t> parseNumber(std::string_view text);
 

@@ -17,7 +17,7 @@ class LiveSampling {
 
   /// Takes a channel in. The size of its group of elements; 0 when no live service has it.
   virtual std::size_t add(std::uint64_t driverID, std::uint64_t channelID) = 0;
-  /// Reads all channels anew.
+  /// Reads all channels again.
   virtual void update() = 0;
   /// Writes the group of channel `index`, by the order of adding, at the beginning of `room`, which
   /// has at least its size. The bytes written; 0 while the channel has no value.

@@ -6,7 +6,7 @@
 //
 // platform/report_protocol.h has the protocol.
 //
-// Channels of live services are read anew for each update.
+// Channels of live services are read again for each update.
 //
 // The buffer holds one group of elements for each channel that the hub knows, in the order of
 // interest; channels that it does not know, and live ones without a value, are left out. The first

@@ -43,7 +43,7 @@ std::optional<std::vector<ChunkRun>> unpackRuns(std::string_view packed);
 /// The values of all runs; nothing when there are more than a distribution may hold.
 std::optional<std::int64_t> valuesIn(std::span<const ChunkRun> runs);
 
-/// The place of the first run that should be joined with all behind it, so that many small commits
+/// The place of the first run that should be joined with all after it, so that many small commits
 /// do not leave a distribution in pieces; `runs.size()` when none should. Only runs of less than
 /// 1,024 values are joined, 64 at most, and while commits are of one size each value twice.
 std::size_t firstToJoin(std::span<const ChunkRun> runs);

@@ -395,7 +395,7 @@ std::optional<SqliteBatch::PendingSeries> SqliteBatch::takeOut(std::span<const C
   return found;
 }
 
-// In new chunks behind all others.
+// In new chunks after all others.
 ChunkRun SqliteBatch::writeRun(const DistributionBlock& block) {
   if (nextChunk_ < 0) {
     nextChunk_ = connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") + 1;

@@ -135,7 +135,7 @@ void migrate(SqliteConnection& connection) {
         to.run();
       }
     }
-    // The chunks stay: only the rows that refer to them are written anew.
+    // The chunks stay: only the rows that refer to them are rewritten.
     connection.execute("DROP TABLE series");
     connection.execute(kSegmentsTable);
     connection.execute(kSetVersion);
