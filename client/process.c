@@ -23,8 +23,8 @@ static bool findFolder(char folder[kLongestFolder]) {
   while (length > 0 && root[length - 1] == '/')
     --length;
   if (length + sizeof kFolder > kLongestFolder) return false;
+  /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): the next copy has the zero */
   if (length > 0) memcpy(folder, root, length);
-  /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): with its zero */
   memcpy(folder + length, kFolder, sizeof kFolder);
   return true;
 }
