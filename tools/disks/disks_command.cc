@@ -83,9 +83,9 @@ const char* unitName(Unit unit) {
 
 std::string ageText(std::int64_t seconds) {
   if (seconds < 120) return format("%lld s", seconds);
-  if (seconds < 2 * 3600) return format("%lld min", seconds / 60);
-  return seconds < 2 * 86'400 ? format("%lld h", seconds / 3600)
-                              : format("%lld days", seconds / 86'400);
+  if (seconds < 7200) return format("%lld min", seconds / 60);
+  return seconds < 172'800 ? format("%lld h", seconds / 3600)
+                           : format("%lld days", seconds / 86'400);
 }
 
 Emphasis emphasisOf(const Verdict& verdict) {
