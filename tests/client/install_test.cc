@@ -15,7 +15,7 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
   flags += " -Wall -Wextra -Wpedantic -Werror " TAVREL_LINK_FLAGS;
   outputOf("cc -std=c11 " + examples + "/record.c -o " + to + "/c " + flags);
   outputOf("c++ -std=c++20 " + examples + "/record.cc -o " + to + "/cpp " + flags);
-  outputOf("cmake -S " + examples + " -B " + to + "/build -DCMAKE_PREFIX_PATH=" + to +
+  outputOf("cmake -G Ninja -S " + examples + " -B " + to + "/build -DCMAKE_PREFIX_PATH=" + to +
            " -DCMAKE_EXE_LINKER_FLAGS='" TAVREL_LINK_FLAGS "' && cmake --build " + to + "/build");
   for (const char* program : {"/c", "/cpp", "/build/record", "/build/record_cpp"})
     EXPECT_EQ(outputOf("LD_LIBRARY_PATH=" + lib + " " + to + program), "");

@@ -133,7 +133,7 @@ for wrong in (lambda: count.add(2**63), lambda: count.add(1.5), lambda: series.r
               lambda: brimhold.Distribution('ü' * 513)):
     try: wrong()
     except Exception as error: print(type(error).__name__)
-print(brimhold.status())
+print(brimhold.status(), flush=True)
 if os.fork() == 0: count.add(40)
 else: os.wait()
 )";

@@ -2,6 +2,7 @@
 
 #include <cerrno>
 #include <cstring>
+#include <ctime>
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <sys/stat.h>
@@ -88,6 +89,25 @@ bool hasLog(const std::string& path) {
     if (stat((path + suffix).c_str(), &status) == 0 && status.st_size != 0) return true;
   }
   return false;
+}
+
+// The file's version, from which on each change shows. Many file systems stamp changes with a clock
+// that moves every 10 ms at most: two changes in one step have the same time.
+std::optional<FileVersion> settledVersion(const std::string& path) {
+  constexpr std::int64_t kStep = 20'000'000;  // nanoseconds, with a margin
+  constexpr timespec kPause{0, kStep};
+  for (int attempt = 0;; ++attempt) {
+    const auto version = FileVersion::of(path);
+    timespec now{};
+    clock_gettime(CLOCK_REALTIME, &now);
+    // A time in the future says that the clock was set: waiting would not help.
+    const bool isRecent =
+        version && (now.tv_sec - version->seconds == 0 || now.tv_sec - version->seconds == 1) &&
+        (now.tv_sec - version->seconds) * 1'000'000'000 + now.tv_nsec - version->nanoseconds <
+            kStep;
+    if (!isRecent || attempt == 3) return version;
+    nanosleep(&kPause, nullptr);
+  }
 }
 
 // True when the store has tables to read.
@@ -187,7 +207,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
   if (!checkIsFile(path)) return std::nullopt;
   // Taken before looking at the log: whatever a writer moves from the log into the file after this
   // changes the version.
-  const auto version = FileVersion::of(path);
+  const auto version = leavesNoTrace ? settledVersion(path) : FileVersion::of(path);
   using Access = SqliteConnection::Access;
   const auto openAs = [&](Access access) -> std::optional<ReadableStore> {
     SqliteConnection connection(path, access, busy);
