@@ -16,7 +16,8 @@ std::pair<double, double> endsOf(std::string_view label) {
   const auto read = [](std::string_view text) {
     double value = kLast;
     std::from_chars(text.data(), text.data() + text.size(), value);
-    return std::isnan(value) ? kLast : value;
+    if (std::isnan(value)) value = kLast;
+    return value;
   };
   const std::size_t comma = label.find(", ");
   if (!label.starts_with('(') || comma == std::string_view::npos) return {kLast, kLast};
