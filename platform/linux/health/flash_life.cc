@@ -50,8 +50,8 @@ std::optional<unsigned> numberOf(std::optional<std::string_view> text) {
 Figures figuresOf(std::span<const FigureKind, 3> kinds, std::optional<unsigned> a,
                   std::optional<unsigned> b, std::optional<unsigned> preEol) {
   Figures figures;
-  if (a && *a >= 1 && *a <= kLastStep) figures.push_back({&kinds[0], *a * 10});
-  if (b && *b >= 1 && *b <= kLastStep) figures.push_back({&kinds[1], *b * 10});
+  if (a && *a >= 1 && *a <= kLastStep) figures.push_back({&kinds[0], std::int64_t{*a} * 10});
+  if (b && *b >= 1 && *b <= kLastStep) figures.push_back({&kinds[1], std::int64_t{*b} * 10});
   if (preEol && *preEol >= 1 && *preEol <= kLastPreEol) figures.push_back({&kinds[2], *preEol});
   return figures;
 }

@@ -5,7 +5,7 @@
 namespace tavrel::health {
 namespace {
 
-constexpr std::int64_t kOldSeconds = 2 * 86'400;
+constexpr std::int64_t kOldSeconds = 172'800;
 
 struct Rule {
   std::string_view figure;

@@ -68,6 +68,7 @@ void addHealth(const DeviceRoot& root, LiveSource& source) {
   const std::vector<health::NamedFigure> figures = figuresNow(root);
   if (figures.empty()) return;
   std::vector<std::string> names;
+  names.reserve(figures.size());
   for (const health::NamedFigure& figure : figures)
     names.push_back(figure.name);
   const std::uint32_t first =
