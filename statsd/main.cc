@@ -72,11 +72,12 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
         options.paths.emplace_back(optarg);
         break;
       case kPrefix:
-        if (!isStatsdPrefix(optarg))
+        if (!isStatsdPrefix(optarg)) {
           return misuse(
               format("not a prefix: %s: give letters, digits, '.', '_' and '-', at most "
                      "200",
                      optarg));
+        }
         options.prefix = optarg;
         break;
       case kIdle:

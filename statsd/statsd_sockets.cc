@@ -169,6 +169,7 @@ Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
                         std::optional<std::chrono::milliseconds> idle,
                         const DatagramHandlers& handlers) {
   std::vector<pollfd> waiting;
+  waiting.reserve(sockets.size());
   for (const DatagramSocket& socket : sockets)
     waiting.push_back({.fd = socket.descriptor(), .events = POLLIN, .revents = 0});
   Batch batch;

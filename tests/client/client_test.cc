@@ -43,7 +43,7 @@ TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   EXPECT_EQ(status, 0);
   fold();
   EXPECT_EQ(scalar("count"), kThreads * kPerThread);
-  expectEachOnce(records["series"], kThreads * kPerThread, dropped);
+  expectEachOnce(records["series"], std::uint64_t{kThreads} * kPerThread, dropped);
   EXPECT_GT(records["series"].size(), std::size_t{kBHChunkCount} * kBHChunkRecords / 2);
   EXPECT_TRUE(segments().empty());
 }

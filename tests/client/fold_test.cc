@@ -27,7 +27,7 @@ using Lines = std::vector<std::string>;
 
 int fromEnvironment(const char* name, int otherwise) {
   const char* const text = std::getenv(name);  // for long runs by hand
-  return text ? std::atoi(text) : otherwise;
+  return text ? static_cast<int>(std::strtol(text, nullptr, 10)) : otherwise;
 }
 
 class FoldTest : public Recording {
@@ -240,7 +240,7 @@ TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {
   EXPECT_FALSE(foldNow().failure);
   look();
   EXPECT_EQ(scalar("count"), processes * kThreads * kPerThread);
-  expectEachOnce(static_cast<std::size_t>(processes * kThreads * kPerThread));
+  expectEachOnce(static_cast<std::size_t>(processes) * kThreads * kPerThread);
   EXPECT_EQ(figure("dropped"), 0);
   EXPECT_TRUE(segments().empty());
 }

@@ -168,6 +168,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
   const auto same = [&](const auto& a, const auto& b) { return !before(a, b) && !before(b, a); };
   columns.erase(std::unique(columns.begin(), columns.end(), same), columns.end());
   std::vector<Cell> cells;
+  cells.reserve(columns.size());
   for (const auto& [token, scale] : columns)
     cells.push_back({token, static_cast<std::uint32_t>(cells.size()), scale});
   const auto width = static_cast<std::uint32_t>(cells.size());
