@@ -128,7 +128,7 @@ TEST(LiveMachineTest, ShowsReadingsOfDrivesThatHold) {
   };
   const FigureKind* const spare = figureKind(DriveKind::Nvme, "spare_pct");
   const FigureKind* const hours = figureKind(DriveKind::Nvme, "power_on_hours");
-  constexpr std::int64_t kTwoDays = 2 * 86'400;
+  constexpr std::int64_t kTwoDays = std::int64_t{2} * 86'400;
   writeReading("nvme0", "b1", kTwoDays - 60, "", {{spare, 97}, {hours, 8}});
   writeReading("nvme1", "b1", kTwoDays + 60, "", {{spare, 1}});
   writeReading("nvme2", "b0", 0, "", {{spare, 2}});
