@@ -273,7 +273,7 @@ std::string descriptor(std::uint32_t count, const std::string& fieldFormat) {
 
 TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   const TemporaryDevice device;
-  std::string records(3000U * 252U, '\0');
+  std::string records(std::size_t{3000} * 252, '\0');
   for (std::size_t at = 0; at < records.size(); at += 252)
     records[at] = 1;
   const Outcome fixed = device.run("nand snapshot -", records);
