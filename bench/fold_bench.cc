@@ -67,7 +67,7 @@ void foldOfSegments(benchmark::State& state) {
     state.ResumeTiming();
     const FoldReport report = platform.fold().run();
     state.PauseTiming();
-    if (report.values != kProcesses * kPerProcess || report.failure) std::abort();
+    if (report.values != std::uint64_t{kProcesses} * kPerProcess || report.failure) std::abort();
     bytes = std::filesystem::file_size(platform.store().path());
     state.ResumeTiming();
   }
