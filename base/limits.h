@@ -105,7 +105,7 @@ inline constexpr std::size_t kWaitingBlocks = 262'144;
 /// Files in that folder that one fold refuses by their looks, each with a text in memory.
 inline constexpr std::size_t kListedRefusals = 4'096;
 
-/// Lines about refused files, keys and users that are told until the device restarts: files that
+/// Most lines in the log about refused files, keys and users until the device restarts: files that
 /// stay are refused by every fold. Further ones are only counted.
 inline constexpr std::size_t kFoldRefusalLines = 100;
 
