@@ -1,13 +1,12 @@
 #include "platform/linux/store/sqlite_batch.h"
 
 #include <algorithm>
-#include <limits>
 #include <utility>
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "base/text.h"
-#include "platform/linux/store/chunk_reader.h"
+#include "platform/linux/store/distribution_writer.h"
 #include "platform/linux/store/sqlite_schema.h"
 
 namespace tavrel {
@@ -30,35 +29,18 @@ void checkKey(std::string_view key) {
                                             std::to_string(limits::kStoreKeyBytes)};
 }
 
-// Of one row, before anything of it has been changed.
-struct RowFailure : StoreFailure {
-  using StoreFailure::StoreFailure;
-};
-
-[[noreturn]] void throwInconsistent() {
-  throw RowFailure{StoreFault::Other,
-                   "the values of a distribution do not match their count: restore the file from "
-                   "a copy or move it away"};
-}
-
 }  // namespace
 
 struct SqliteBatch::Statements {
-  explicit Statements(const SqliteConnection& connection)
+  explicit Statements(SqliteConnection& connection)
       : setScalar(connection,
                   "INSERT OR REPLACE INTO scalars (day, key, value) VALUES (?1, ?2, ?3)"),
         getScalar(connection, "SELECT value FROM scalars WHERE day = ?1 AND key = ?2"),
-        getRuns(connection, "SELECT count, runs FROM distributions WHERE day = ?1 AND key = ?2"),
-        setRuns(connection,
-                "INSERT OR REPLACE INTO distributions (day, key, count, runs) "
-                "VALUES (?1, ?2, ?3, ?4)"),
-        addChunk(connection, "INSERT INTO chunks (chunk, data) VALUES (?1, ?2)") {}
+        distributions(connection) {}
 
   SqliteStatement setScalar;
   SqliteStatement getScalar;
-  SqliteStatement getRuns;
-  SqliteStatement setRuns;
-  SqliteStatement addChunk;
+  DistributionWriter distributions;
 };
 
 std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
@@ -303,7 +285,7 @@ void SqliteBatch::writeDistributions() {
   for (const auto* entry : series) {
     const DistributionBlock added{entry->second->values, entry->second->offsets};
     try {
-      writeSeries(entry->first, added);
+      statements_->distributions.append(entry->first.day, entry->first.key, added);
     } catch (const RowFailure& failure) {
       if (!refuses_) throw;
       if (refused_ == 0) {
@@ -329,84 +311,6 @@ Expected<std::uint64_t> SqliteBatch::refusedValues() {
   return refused_;
 }
 
-void SqliteBatch::writeSeries(const SeriesName& name, const DistributionBlock& added) {
-  Statements& sql = *statements_;
-  sql.getRuns.bind(1, name.day);
-  sql.getRuns.bind(2, name.key);
-  std::vector<ChunkRun> runs;
-  std::int64_t count = 0;
-  if (sql.getRuns.step()) {
-    count = sql.getRuns.integer(0);
-    auto unpacked = unpackRuns(sql.getRuns.bytes(1));
-    sql.getRuns.reset();
-    if (!unpacked || count <= 0 || valuesIn(*unpacked) != count) throwInconsistent();
-    runs = std::move(*unpacked);
-  }
-  sql.getRuns.reset();
-
-  const auto addedCount = static_cast<std::int64_t>(added.values.size() / kPackedValueBytes);
-  if (addedCount > kValuesPerDistribution - count) {
-    throw RowFailure{StoreFault::Other, "a distribution holds " + std::to_string(count) +
-                                            " values of one day and takes no more: use another "
-                                            "key"};
-  }
-  runs.push_back({0, 0, addedCount});
-  const std::size_t first = std::min(firstToJoin(runs), runs.size() - 1);
-  // Values that are damaged stay where they are, and each reader tells of them.
-  if (auto earlier = takeOut(std::span(runs).subspan(first, runs.size() - 1 - first))) {
-    runs[first] = writeRun({earlier->values += added.values, earlier->offsets += added.offsets});
-    runs.resize(first + 1);
-  } else {
-    runs.back() = writeRun(added);
-  }
-
-  std::string packed;
-  for (const ChunkRun& run : runs)
-    appendRun(packed, run);
-  sql.setRuns.bind(1, name.day);
-  sql.setRuns.bind(2, name.key);
-  sql.setRuns.bind(3, count + addedCount);
-  sql.setRuns.bind(4, std::string_view(packed));
-  sql.setRuns.run();
-}
-
-// Takes the chunks of the runs out of the store. Nothing, and nothing is changed, when they are not
-// what the runs say.
-std::optional<SqliteBatch::PendingSeries> SqliteBatch::takeOut(std::span<const ChunkRun> runs) {
-  if (runs.empty()) return std::nullopt;
-  PendingSeries found;
-  try {
-    ChunkReader reader(connection_);
-    reader.begin({runs.begin(), runs.end()}, *valuesIn(runs));
-    while (const auto block = reader.next(true)) {
-      found.values += block->values;
-      found.offsets += block->offsets;
-    }
-  } catch (const StoreFailure& failure) {
-    if (failure.fault != StoreFault::Other) throw;
-    return std::nullopt;
-  }
-  SqliteStatement remove(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
-  for (const ChunkRun& run : runs) {
-    remove.bind(1, run.first);
-    remove.bind(2, run.end());
-    remove.run();
-  }
-  return found;
-}
-
-// In new chunks after all others.
-ChunkRun SqliteBatch::writeRun(const DistributionBlock& block) {
-  if (nextChunk_ < 0) {
-    nextChunk_ = connection_.integer("SELECT ifnull(max(chunk), -1) FROM chunks") + 1;
-  }
-  const auto count = static_cast<std::int64_t>(block.values.size() / kPackedValueBytes);
-  const ChunkRun run{nextChunk_, (count + kValuesPerChunk - 1) / kValuesPerChunk, count};
-  addChunks(block.values, kValuesPerChunk * kPackedValueBytes);
-  addChunks(block.offsets, kValuesPerChunk * kPackedOffsetBytes);
-  return run;
-}
-
 void SqliteBatch::finish() {
   if (kept_.exist()) begin();
   writeScalars();
@@ -415,19 +319,6 @@ void SqliteBatch::finish() {
   connection_.execute("COMMIT");
   if (takenNumber_) removeTakenValues();
   limitLog();
-}
-
-void SqliteBatch::addChunks(std::string_view data, std::size_t bytesPerChunk) {
-  SqliteStatement& statement = statements_->addChunk;
-  for (; !data.empty(); data.remove_prefix(std::min(bytesPerChunk, data.size()))) {
-    if (nextChunk_ < 0 || nextChunk_ == std::numeric_limits<std::int64_t>::max()) {
-      throw StoreFailure{StoreFault::Other,
-                         "no number is left for more values: move the file away"};
-    }
-    statement.bind(1, nextChunk_++);
-    statement.bind(2, data.substr(0, bytesPerChunk));
-    statement.run();
-  }
 }
 
 SqliteConnection SqliteBatch::release() {

@@ -23,7 +23,6 @@
 
 #include "base/expected.h"
 #include "platform/distribution_values.h"
-#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_connection.h"
 #include "platform/linux/store/sqlite_segments.h"
@@ -114,10 +113,6 @@ class SqliteBatch {
   std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
-  void writeSeries(const SeriesName& name, const DistributionBlock& added);
-  std::optional<PendingSeries> takeOut(std::span<const ChunkRun> runs);
-  ChunkRun writeRun(const DistributionBlock& block);
-  void addChunks(std::string_view data, std::size_t bytesPerChunk);
   Error describe(const StoreFailure& failure) const;
 
   SqliteConnection connection_;
@@ -134,7 +129,6 @@ class SqliteBatch {
   const PendingMap::value_type* last_ = nullptr;
   bool refuses_ = false;
   std::uint64_t refused_ = 0;
-  std::int64_t nextChunk_ = -1;  // not looked up yet when negative
 };
 
 }  // namespace tavrel
