@@ -1,6 +1,7 @@
 // Folds of real segments into a real store.
 
 #include <algorithm>
+#include <array>
 #include <cstdlib>
 #include <fstream>
 #include <random>
@@ -10,6 +11,8 @@
 #include <sys/vfs.h>
 #include <thread>
 
+#include "base/bytes.h"
+#include "base/limits.h"
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/folding/segment_folder.h"
@@ -301,6 +304,16 @@ TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
   EXPECT_EQ(scalar("count"), 3);  // nor what the store held
 }
 
+TEST_F(FoldTest, ASetKeepsWhatTheFoldAddedBefore) {
+  run([] { BHClientScalarAdd(keys().gauge, 5); });
+  for (std::size_t i = 0; i < limits::kFoldSegmentsAtOnce; ++i)
+    run([] { add(1); });
+  run([] { set(10); });
+  foldNow();
+  look();
+  EXPECT_EQ(scalar("gauge"), 15);
+}
+
 TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   if (geteuid() != 0) GTEST_SKIP() << "needs root";
   std::filesystem::create_directories(root / "etc/tavrel");
@@ -503,8 +516,12 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   kill(child, SIGKILL);
   waitFor(child);
 
-  // A segment that cannot be opened now keeps its position.
+  // A segment that cannot be read now keeps its position.
   const std::string segment = segments().at(0);
+  std::filesystem::create_hard_link(segment, root / "copy");
+  EXPECT_EQ(foldNow().segmentsRefused, 1U);
+  EXPECT_EQ(held(), 1U);
+  std::filesystem::remove(root / "copy");
   signal(SIGIO, SIG_IGN);
   {
     const Descriptor leased(open(segment.c_str(), O_RDWR | O_CLOEXEC));
@@ -518,6 +535,30 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   look();
   EXPECT_EQ(scalar("count"), 3);
   EXPECT_EQ(figure("dropped"), 1'000'000'000);
+}
+
+TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurn) {
+  run([] { add(1); });
+  const std::string model = segments().at(0);
+  const Descriptor from(open(model.c_str(), O_RDONLY | O_CLOEXEC));
+  const SegmentFile file(from.get());
+  constexpr std::uint64_t kSegments = 2 * limits::kSegmentsPerUser + 100;
+  for (std::uint64_t number = 1; number < kSegments; ++number) {
+    const auto path = folder / (std::to_string(number) + ".segment");
+    const Descriptor to(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
+    ASSERT_EQ(ftruncate(to.get(), kBHSegmentBytes), 0);
+    for (const unsigned at : {0U, unsigned{kBHKeyTable}, unsigned{kBHNames}, unsigned{kBHCells}}) {
+      std::array<std::byte, 256> bytes;
+      file.read(at, bytes);
+      if (at == 0) storeLittle64(bytes, kBHHeaderIdentity, number);
+      ASSERT_EQ(pwrite(to.get(), bytes.data(), bytes.size(), at), 256);
+    }
+  }
+  for (const std::uint64_t waiting :
+       {kSegments - limits::kSegmentsPerUser, std::uint64_t{100}, std::uint64_t{0}})
+    EXPECT_EQ(foldNow().waiting, waiting);
+  look();
+  EXPECT_EQ(scalar("count"), kSegments);
 }
 
 TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
@@ -538,7 +579,7 @@ TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
 TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
   run([] { add(1); });
   const auto opened = SegmentFolder::open(DeviceRoot(root));
-  const auto segment = (*opened)->openSegment((*opened)->list().segments.at(0));
+  const auto segment = (*opened)->openSegment((*opened)->list()->segments.at(0));
   EXPECT_TRUE((*opened)->openToAcknowledge(**segment));
   const std::string path = segments().at(0);
   std::filesystem::copy_file(path, root / "copy");

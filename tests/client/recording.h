@@ -2,6 +2,7 @@
 #pragma once
 
 #include <atomic>
+#include <csignal>
 #include <cstdint>
 #include <fcntl.h>
 #include <filesystem>
@@ -11,6 +12,7 @@
 #include <map>
 #include <string>
 #include <sys/mman.h>
+#include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
@@ -40,10 +42,12 @@ T& shared() {
   return *new (memory) T{};
 }
 
-/// Runs `program` in a child, which ends with status 0 unless it was killed.
+/// Runs `program` in a child, which ends with status 0 unless it was killed, and with this process
+/// at the latest.
 inline pid_t start(const std::function<void()>& program) {
   const pid_t child = fork();
   if (child == 0) {
+    prctl(PR_SET_PDEATHSIG, SIGKILL);
     program();
     _exit(testing::Test::HasFailure() ? 1 : 0);
   }

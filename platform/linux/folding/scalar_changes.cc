@@ -13,10 +13,12 @@ ScalarChanges::Change& ScalarChanges::changeOf(std::int32_t day, std::string_vie
   return found->second;
 }
 
-void ScalarChanges::set(std::int32_t day, std::string_view key, std::int64_t value) {
+void ScalarChanges::set(std::int32_t day, std::string_view key, std::int64_t value,
+                        std::int64_t added) {
   Change& change = changeOf(day, key);
   change.isSet = true;
   change.value = value;
+  change.added = added;
 }
 
 void ScalarChanges::add(std::int32_t day, std::string_view key, std::int64_t amount) {

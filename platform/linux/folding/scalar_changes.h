@@ -38,7 +38,8 @@ class ScalarChanges {
     std::int64_t added = 0;
   };
 
-  void set(std::int32_t day, std::string_view key, std::int64_t value);
+  /// `added`: what was added to the row so far, also in earlier transactions.
+  void set(std::int32_t day, std::string_view key, std::int64_t value, std::int64_t added);
   void add(std::int32_t day, std::string_view key, std::int64_t amount);
 
   const RowMap<Change>& rows() const { return changes_; }

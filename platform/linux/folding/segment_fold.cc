@@ -28,6 +28,7 @@ using SegmentNames = std::set<SegmentName, LessName>;
 
 // What is done with a segment once the store has taken its values.
 struct FoldedSegment {
+  SegmentName name;
   OpenSegment segment;
   SegmentProgress progress;
   bool isOver;  // nobody can write to it, and nothing is left in it
@@ -50,7 +51,7 @@ class FoldRun {
   Status run(const SegmentFolder::Listing& listing);
 
  private:
-  Status fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& segments);
+  Status fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing);
   Status take(SqliteBatch& batch, const SegmentEntry& entry);
   Status takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
                     const SegmentName& name, bool isWriterGone);
@@ -70,7 +71,8 @@ class FoldRun {
   std::optional<SegmentNames> known_;               // whose positions the store holds
   std::map<std::uint32_t, std::size_t> positions_;  // of each user
   SegmentNames found_;
-  std::set<std::uint32_t> unseen_;  // users with segments whose identities are not known
+  std::set<std::uint32_t> unseen_;    // users with segments whose identities are not known
+  std::vector<SegmentName> removed_;  // whose positions would keep new segments waiting
   std::map<std::uint32_t, std::uint64_t> values_;
   std::set<std::uint32_t> toldUsers_;
   std::size_t next_ = 0;  // in the listing
@@ -86,6 +88,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
     unseen_.insert(owner);
     report_.waiting += count;
   }
+  unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
     refuse(line);
   if (listing.segments.empty() && counts_.segmentsRefused == 0) return Done{};
@@ -94,11 +97,11 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
     if (!batch) return batch.error();
     // One damaged row must not keep all that programs recorded from the store.
     (*batch)->refuseUnwritableSeries();
-    Status done = fillBatch(**batch, listing.segments);
+    Status done = fillBatch(**batch, listing);
     if (done) done = (*batch)->commit();
     if (!done) return done;
     finishSegments();
-  } while (next_ < listing.segments.size());
+  } while (next_ < listing.segments.size() || !removed_.empty());
   return Done{};
 }
 
@@ -106,7 +109,7 @@ void FoldRun::refuse(std::string_view line) {
   if (notes_.tell(line)) ++counts_.segmentsRefused;
 }
 
-Status FoldRun::fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& segments) {
+Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing) {
   if (!known_) {
     const auto names = batch.segmentNames();
     if (!names) return names.error();
@@ -114,11 +117,15 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const std::vector<SegmentEntry>& s
     for (const SegmentName& name : *known_)
       ++positions_[name.owner];
   }
-  while (next_ < segments.size() && folded_.size() < limits::kFoldSegmentsAtOnce &&
-         counts_.values < limits::kFoldValuesAtOnce && changes_.bytes() < limits::kFoldKeyBytes) {
-    if (Status done = take(batch, segments[next_++]); !done) return done;
+  for (const SegmentName& name : std::exchange(removed_, {})) {
+    if (Status done = batch.removeSegmentPosition(name.owner, name.identity); !done) return done;
+    --positions_[name.owner];
   }
-  if (next_ == segments.size()) {
+  while (next_ < listing.segments.size() && folded_.size() < limits::kFoldSegmentsAtOnce &&
+         counts_.values < limits::kFoldValuesAtOnce && changes_.bytes() < limits::kFoldKeyBytes) {
+    if (Status done = take(batch, listing.segments[next_++]); !done) return done;
+  }
+  if (next_ == listing.segments.size() && listing.isWhole) {
     if (Status done = dropPositions(batch); !done) return done;
   }
   if (Status done = changes_.giveTo(batch); !done) return done;
@@ -156,7 +163,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     return Done{};
   }
   if (*state == SegmentReader::State::Empty) {
-    if (isWriterGone) folded_.push_back({*std::move(*segment), {}, true});
+    if (isWriterGone) folded_.push_back({{}, *std::move(*segment), {}, true});
     return Done{};
   }
   const SegmentName name{owner, facts.identity};
@@ -222,7 +229,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
   const bool isOver = isWriterGone && progress.isComplete;
   if (isOver || !progress.acknowledgements.empty()) {
-    folded_.push_back({std::move(segment), std::move(progress), isOver});
+    folded_.push_back({name, std::move(segment), std::move(progress), isOver});
   }
   return Done{};
 }
@@ -240,7 +247,11 @@ void FoldRun::finishSegments() {
   if (!folded_.empty()) notes_.mark();
   for (const FoldedSegment& folded : folded_) {
     if (folded.isOver) {
-      if (folder_.remove(folded.segment)) ++counts_.removed;
+      if (!folder_.remove(folded.segment)) continue;
+      ++counts_.removed;
+      if (positions_[folded.name.owner] > limits::kSegmentsPerUser / 2) {
+        removed_.push_back(folded.name);
+      }
       continue;
     }
     // What cannot be given back now is given back by the next fold.
@@ -279,10 +290,14 @@ FoldReport SegmentFold::run() {
   if (const Status cleared = (*folder)->clearRequest(); !cleared) {
     notes->tell(cleared.error().message);
   }
-  const SegmentFolder::Listing listing = (*folder)->list();
-  if (listing.segments.empty() && listing.refusals.empty()) return report;
+  const Expected<SegmentFolder::Listing> listing = (*folder)->list();
+  if (!listing) {
+    report.failure = listing.error().message;
+    return report;
+  }
+  if (listing->segments.empty() && listing->refusals.empty()) return report;
   const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
-  if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(listing);
+  if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(*listing);
       !done) {
     report.failure = done.error().message + "; what programs recorded waits for the next fold";
   }

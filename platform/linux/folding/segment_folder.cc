@@ -75,7 +75,7 @@ Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& roo
   return std::optional(SegmentFolder(std::move(path), std::move(folder), status.st_dev));
 }
 
-SegmentFolder::Listing SegmentFolder::list() const {
+Expected<SegmentFolder::Listing> SegmentFolder::list() const {
   Listing listing;
   const auto refuse = [&](std::string_view name, std::string_view reason) {
     if (listing.refusals.size() < limits::kListedRefusals) {
@@ -84,7 +84,7 @@ SegmentFolder::Listing SegmentFolder::list() const {
   };
   const std::unique_ptr<DIR, CloseFolder> folder(
       fdopendir(openat(folder_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC)));
-  if (!folder) return listing;
+  if (!folder) return systemError("list", path_);
   std::minstd_rand random(std::random_device{}());
   std::map<std::uint32_t, Sample<std::string>> byOwner;
   std::size_t entries = 0;
@@ -93,6 +93,7 @@ SegmentFolder::Listing SegmentFolder::list() const {
     if (name == "." || name == ".." || name == kRequest) continue;
     if (++entries > limits::kSegmentFolderEntries) {
       refuse(name, "the folder has too many files, and the rest is not looked at");
+      listing.isWhole = false;
       break;
     }
     if (!name.ends_with(kSegmentEnding)) {
@@ -103,6 +104,7 @@ SegmentFolder::Listing SegmentFolder::list() const {
     if (fstatat(folder_.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
     if (const char* const fault = faultOf(status, device_)) {
       refuse(name, fault);
+      if (S_ISREG(status.st_mode)) listing.linked.insert(status.st_uid);
       continue;
     }
     byOwner.try_emplace(status.st_uid, limits::kSegmentsPerUser)

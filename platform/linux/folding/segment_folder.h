@@ -6,6 +6,7 @@
 #include <cstdint>
 #include <map>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <sys/stat.h>
@@ -43,10 +44,13 @@ class SegmentFolder {
     /// Segments that were left out, by owner. Of too many, a random choice is listed, so that each
     /// gets its turn.
     std::map<std::uint32_t, std::uint64_t> leftOut;
+    /// Owners of files that are refused only as long as they have several names.
+    std::set<std::uint32_t> linked;
     std::vector<std::string> refusals;  // lines for people
+    bool isWhole = true;                // no entry of the folder was left unseen
   };
   /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all.
-  Listing list() const;
+  Expected<Listing> list() const;
 
   /// Opens a segment for reading. Nothing when it has gone. An error, for people, refuses it.
   Expected<std::optional<OpenSegment>> openSegment(const SegmentEntry& entry) const;

@@ -39,10 +39,14 @@ void SegmentIntake::takeScalar(const SegmentScalar& scalar) {
       mayTake(scalar.key, scalar.day) ? rows_.find(user_, scalar.day, scalar.key, true) : nullptr;
   if (row == nullptr) return void(++refused_);
   ++scalars_;
-  if (!scalar.isSet) return changes_.add(scalar.day, scalar.key, scalar.value);
+  if (!scalar.isSet) {
+    std::int64_t sum = 0;
+    if (!__builtin_add_overflow(row->added, scalar.value, &sum)) row->added = sum;
+    return changes_.add(scalar.day, scalar.key, scalar.value);
+  }
   if (scalar.setTime < row->latestSet) return;
   row->latestSet = scalar.setTime;
-  changes_.set(scalar.day, scalar.key, scalar.value);
+  changes_.set(scalar.day, scalar.key, scalar.value, row->added);
 }
 
 SegmentIntake::Series& SegmentIntake::seriesOf(const SegmentRecord& record) {

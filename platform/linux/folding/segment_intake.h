@@ -21,7 +21,9 @@ namespace tavrel {
 class FoldedRows {
  public:
   struct Row {
-    std::int64_t latestSet = std::numeric_limits<std::int64_t>::min();  // of a scalar
+    // Of a scalar.
+    std::int64_t latestSet = std::numeric_limits<std::int64_t>::min();
+    std::int64_t added = 0;
   };
 
   /// Nothing when the row would be one too many. The first user of a row is charged with it.

@@ -37,11 +37,12 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
     waiting.copied_ = Descriptor(memfd_create("waiting values", MFD_CLOEXEC));
     if (!waiting.copied_) return systemError("copy segments from", folder.path());
   }
-  const SegmentFolder::Listing listing = folder.list();
-  for (const auto& [owner, count] : listing.leftOut)
+  const Expected<SegmentFolder::Listing> listing = folder.list();
+  if (!listing) return listing.error();
+  for (const auto& [owner, count] : listing->leftOut)
     waiting.leftOut_ += count;
   FoldedRows rows;
-  for (const SegmentEntry& entry : listing.segments) {
+  for (const SegmentEntry& entry : listing->segments) {
     if (waiting.blocks_ >= limits::kWaitingBlocks ||
         waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
       ++waiting.leftOut_;
