@@ -30,21 +30,28 @@ struct DistributionBlock {
   std::string_view offsets;
 };
 
-/// Appends to packed values and to their packed offsets.
-inline void appendPacked(std::string& values, std::string& offsets,
-                         std::span<const DistributionSample> samples) {
-  std::size_t value = values.size();
-  std::size_t offset = offsets.size();
-  values.resize(value + samples.size() * kPackedValueBytes);
-  offsets.resize(offset + samples.size() * kPackedOffsetBytes);
-  const MutableByteSpan valueBytes = std::as_writable_bytes(std::span(values));
-  const MutableByteSpan offsetBytes = std::as_writable_bytes(std::span(offsets));
+/// Packs samples into two spaces, each large enough.
+inline void pack(std::span<const DistributionSample> samples, MutableByteSpan values,
+                 MutableByteSpan offsets) {
+  std::size_t value = 0;
+  std::size_t offset = 0;
   for (const DistributionSample& sample : samples) {
-    storeLittle64(valueBytes, value, std::bit_cast<std::uint64_t>(sample.value));
-    storeLittle32(offsetBytes, offset, sample.secondsInDayOffset);
+    storeLittle64(values, value, std::bit_cast<std::uint64_t>(sample.value));
+    storeLittle32(offsets, offset, sample.secondsInDayOffset);
     value += kPackedValueBytes;
     offset += kPackedOffsetBytes;
   }
+}
+
+/// Appends to packed values and to their packed offsets.
+inline void appendPacked(std::string& values, std::string& offsets,
+                         std::span<const DistributionSample> samples) {
+  const std::size_t value = values.size();
+  const std::size_t offset = offsets.size();
+  values.resize(value + samples.size() * kPackedValueBytes);
+  offsets.resize(offset + samples.size() * kPackedOffsetBytes);
+  pack(samples, std::as_writable_bytes(std::span(values)).subspan(value),
+       std::as_writable_bytes(std::span(offsets)).subspan(offset));
 }
 
 /// The value whose bytes begin at `value`.

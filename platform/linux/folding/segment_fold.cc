@@ -68,6 +68,7 @@ class FoldRun {
   const BootInstant boot_ = currentBootInstant();
 
   FoldedRows rows_;
+  SampleBuffers buffers_;
   std::optional<SegmentNames> known_;               // whose positions the store holds
   std::map<std::uint32_t, std::size_t> positions_;  // of each user
   SegmentNames found_;
@@ -205,7 +206,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
       return Done{};
     }
   }
-  SegmentIntake intake(name.owner, recorders_, rows_, changes_);
+  SegmentIntake intake(name.owner, recorders_, rows_, changes_, buffers_);
   SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
   if (Status done = giveTo(batch, intake); !done) return done;
   if (const std::string after = position.encode(); after != before) {

@@ -49,27 +49,42 @@ void SegmentIntake::takeScalar(const SegmentScalar& scalar) {
   changes_.set(scalar.day, scalar.key, scalar.value, row->added);
 }
 
-SegmentIntake::Series& SegmentIntake::seriesOf(const SegmentRecord& record) {
-  if (recent_.empty()) recent_.resize(kBHKeys + 1);
-  Series*& recent = recent_[record.keyNumber];
-  if (recent != nullptr && recent->day == record.day) return *recent;
-  const auto [found, isNew] = series_.try_emplace({record.keyNumber, record.day});
-  Series& series = found->second;
+std::uint32_t SegmentIntake::findSeries(const SegmentRecord& record) {
+  const auto [found, isNew] = places_.try_emplace({record.keyNumber, record.day},
+                                                  static_cast<std::uint32_t>(series_.size()));
   if (isNew) {
-    series.key = record.key;
-    series.day = record.day;
-    series.isRefused = !mayTake(record.key, record.day) ||
-                       rows_.find(user_, record.day, record.key, false) == nullptr;
+    const bool isTaken = mayTake(record.key, record.day) &&
+                         rows_.find(user_, record.day, record.key, false) != nullptr;
+    series_.push_back({record.key, record.day, !isTaken});
   }
-  recent = &series;
-  return series;
+  return found->second;
 }
 
 void SegmentIntake::takeRecord(const SegmentRecord& record) {
-  Series& series = seriesOf(record);
+  if (recent_.empty()) recent_.resize(kBHKeys + 1);
+  RecentSeries& recent = recent_[record.keyNumber];
+  if (recent.day != record.day || recent.place == kNone) {
+    recent = {record.day, findSeries(record)};
+  }
+  Series& series = series_[recent.place];
   if (series.isRefused) return void(++refused_);
-  ++values_;
-  series.samples.push_back({record.value, record.secondsInDay});
+  ++series.count;
+  buffers_.recorded_.push_back({record.value, record.secondsInDay, recent.place});
+}
+
+std::span<const DistributionSample> SegmentIntake::samplesBySeries() const {
+  std::vector<std::size_t> next;  // of each series, the place of its next sample
+  next.reserve(series_.size());
+  std::size_t count = 0;
+  for (const Series& series : series_) {
+    next.push_back(count);
+    count += series.count;
+  }
+  std::vector<DistributionSample>& sorted = buffers_.bySeries_;
+  if (sorted.size() < count) sorted.resize(count);
+  for (const SampleBuffers::Sample& sample : buffers_.recorded_)
+    sorted[next[sample.series]++] = {sample.value, sample.secondsInDay};
+  return std::span(sorted).first(count);
 }
 
 }  // namespace tavrel

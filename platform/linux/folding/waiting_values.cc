@@ -42,6 +42,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
   for (const auto& [owner, count] : listing->leftOut)
     waiting.leftOut_ += count;
   FoldedRows rows;
+  SampleBuffers buffers;
   for (const SegmentEntry& entry : listing->segments) {
     if (waiting.blocks_ >= limits::kWaitingBlocks ||
         waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
@@ -51,7 +52,8 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
     const auto segment = folder.openSegment(entry);
     // The fold tells what is refused.
     if (!segment || !*segment) continue;
-    if (Status added = waiting.add(**segment, recorders, history, selection, rows); !added) {
+    if (Status added = waiting.add(**segment, recorders, history, selection, rows, buffers);
+        !added) {
       return added.error();
     }
   }
@@ -59,7 +61,8 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
 }
 
 Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders,
-                          SqliteHistory* history, const RowSelection& selection, FoldedRows& rows) {
+                          SqliteHistory* history, const RowSelection& selection, FoldedRows& rows,
+                          SampleBuffers& buffers) {
   SegmentReader reader(segment.file.get());
   const SegmentFacts facts = reader.facts();
   // A lease could be in the way of a fold.
@@ -76,7 +79,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
       position = *std::move(decoded);
     }
   }
-  SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_);
+  SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffers);
   SelectingSink sink(selection, intake);
   reader.read(position, currentBootInstant(), isWriterGone, sink);
   Status added = Done{};

@@ -62,7 +62,7 @@ class WaitingValues {
  private:
   WaitingValues() = default;
   Status add(const OpenSegment& segment, const Recorders& recorders, SqliteHistory* history,
-             const RowSelection& selection, FoldedRows& rows);
+             const RowSelection& selection, FoldedRows& rows, SampleBuffers& buffers);
   Status addSeries(const RowSelection& selection, std::int32_t day, std::string_view key,
                    std::span<const DistributionSample> samples);
 

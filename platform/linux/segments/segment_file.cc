@@ -56,30 +56,45 @@ SegmentFacts SegmentFile::facts() const {
   return facts;
 }
 
-SegmentFile::Key SegmentFile::readKey(std::uint32_t number) const {
-  Key key;
-  const std::uint64_t entry =
-      word64(kBHKeyTable + std::uint64_t{number - 1} * std::uint64_t{kBHKeyEntryBytes});
-  const std::uint64_t offset = entry & 0xffffffff;
-  const std::size_t length = (entry >> 32) & 0xffff;
-  if (length == 0 || length > kBHLongestName || offset > kBHNamesBytes ||
-      length > kBHNamesBytes - offset) {
-    return key;
+// Reads the keys around the one with this number too: their names follow each other.
+void SegmentFile::readKeys(std::uint32_t number) {
+  constexpr std::uint32_t kAtOnce = 64;
+  const std::uint32_t first = (number - 1) / kAtOnce * kAtOnce;
+  std::array<std::byte, std::size_t{kAtOnce} * kBHKeyEntryBytes> entries;
+  read(kBHKeyTable + std::uint64_t{first} * std::uint64_t{kBHKeyEntryBytes}, entries);
+  // A name is written before its entry, and so is there when the entries have been read.
+  std::array<std::byte, 8192> names;
+  std::uint64_t namesStart = 0;
+  std::uint64_t namesEnd = 0;
+  for (std::uint32_t i = 0; i < kAtOnce; ++i) {
+    Key& key = keys_[first + i + 1];
+    if (key.isRead) continue;
+    const std::uint64_t entry =
+        *loadLittle64(entries, std::size_t{i} * std::size_t{kBHKeyEntryBytes});
+    const std::uint64_t offset = entry & 0xffffffff;
+    const std::size_t length = (entry >> 32) & 0xffff;
+    if (length == 0 || length > kBHLongestName || offset > kBHNamesBytes ||
+        length > kBHNamesBytes - offset) {
+      continue;
+    }
+    if (offset < namesStart || offset + length > namesEnd) {
+      const std::size_t size = std::min(names.size(), std::size_t{kBHNamesBytes} - offset);
+      read(kBHNames + offset, MutableByteSpan(names).first(size));
+      namesStart = offset;
+      namesEnd = offset + size;
+    }
+    key.name = asText(ByteSpan(names).subspan(offset - namesStart, length));
+    if (isValidName(key.name)) key.kind = static_cast<std::uint8_t>(entry >> 48);
+    key.isRead = true;
   }
-  key.name.resize(length);
-  read(kBHNames + offset, std::as_writable_bytes(std::span(key.name)));
-  if (isValidName(key.name)) key.kind = static_cast<std::uint8_t>(entry >> 48);
-  return key;
+  keys_[number].isRead = true;
 }
 
 const std::string* SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
   if (number == 0 || number > kBHKeys) return nullptr;
   if (keys_.empty()) keys_.resize(kBHKeys + 1);
-  Key& key = keys_[number];
-  if (!key.isRead) {
-    key = readKey(number);
-    key.isRead = true;
-  }
+  const Key& key = keys_[number];
+  if (!key.isRead) readKeys(number);
   return key.kind == kind ? &key.name : nullptr;
 }
 

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <array>
+#include <cstddef>
 #include <cstdint>
 #include <string>
 #include <vector>
@@ -42,7 +43,7 @@ class SegmentFile {
     std::string name;
   };
 
-  Key readKey(std::uint32_t number) const;
+  void readKeys(std::uint32_t number);
 
   int descriptor_;
   std::vector<Key> keys_;  // by number, once one was asked for

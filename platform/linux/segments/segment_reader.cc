@@ -19,6 +19,9 @@ namespace {
 // How often to look at a cell that is being set, before it is left for later.
 constexpr int kCellAttempts = 8;
 
+// Chunks that are read with one call.
+constexpr std::uint32_t kChunksAtOnce = 16;
+
 std::int64_t saturatingAdd(std::int64_t a, std::int64_t b) {
   std::int64_t sum;
   if (!__builtin_add_overflow(a, b, &sum)) return sum;
@@ -115,6 +118,10 @@ CellLook cellIn(ByteSpan bytes, std::uint64_t at) {
   return look;
 }
 
+std::uint64_t markIn(ByteSpan chunk, std::uint32_t record) {
+  return *loadLittle64(chunk, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes + 8);
+}
+
 bool awaitsAcknowledgement(const CellLook& look) {
   return look.closes % 2 != 0 && look.acknowledged != look.closes;
 }
@@ -133,7 +140,34 @@ struct SegmentReader::Reading {
   bool writerIsGone;
   SegmentSink& sink;
   SegmentProgress progress;
+  std::vector<std::byte> bytes;  // of chunks
 };
+
+// What is known of a chunk, and how far its records go.
+struct SegmentReader::ChunkLook {
+  std::uint32_t generation = 0;  // 0: nothing to read
+  std::uint32_t acknowledged = 0;
+  std::uint32_t folded = 0;
+  std::uint32_t ready = 0;
+  bool hasNews = false;
+};
+
+SegmentReader::ChunkLook SegmentReader::chunkIn(ByteSpan bytes,
+                                                const SegmentPosition::Chunk& position,
+                                                bool writerIsGone) {
+  ChunkLook look;
+  const std::uint32_t generation = *loadLittle32(bytes, kBHChunkGeneration);
+  if (generation == 0 || generation % 2 != 0) return look;
+  look.generation = generation;
+  look.acknowledged = *loadLittle32(bytes, kBHChunkAcknowledged);
+  if (position.generation == generation) {
+    look.folded = std::min<std::uint32_t>(position.folded, kBHChunkRecords);
+  }
+  look.ready = look.folded;
+  // Records of a writer that is gone may follow one that it did not finish.
+  look.hasNews = look.folded < kBHChunkRecords && (writerIsGone || markIn(bytes, look.folded) != 0);
+  return look;
+}
 
 Expected<SegmentReader::State> SegmentReader::state() const {
   struct stat status {};
@@ -156,7 +190,7 @@ Expected<SegmentReader::State> SegmentReader::state() const {
 
 SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                                     SegmentSink& sink) {
-  Reading reading{position, boot, writerIsGone, sink, {}};
+  Reading reading{position, boot, writerIsGone, sink, {}, {}};
   const std::uint64_t dropped = file_.word64(kBHHeaderDropped);
   reading.progress.dropped = dropped - position.dropped;
   reading.progress.nextFolds = file_.word64(kBHHeaderFolds) + 1;
@@ -165,8 +199,8 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
   const std::uint32_t chunks =
       std::min<std::uint32_t>(file_.word32(kBHHeaderChunksUsed), kBHChunkCount);
   if (position.chunks.size() < chunks) position.chunks.resize(chunks);
-  for (std::uint32_t i = 0; i < chunks; ++i)
-    readChunk(reading, i);
+  for (std::uint32_t first = 0; first < chunks; first += kChunksAtOnce)
+    readChunks(reading, first, std::min(kChunksAtOnce, chunks - first));
   return std::move(reading.progress);
 }
 
@@ -230,62 +264,72 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   }
 }
 
-void SegmentReader::readChunk(Reading& reading, std::uint32_t index) {
-  const std::uint64_t offset = kBHChunks + std::uint64_t{index} * std::uint64_t{kBHChunkBytes};
-  SegmentPosition::Chunk& folded = reading.position.chunks[index];
-  const std::uint32_t generation = file_.word32(offset + kBHChunkGeneration);
-  if (generation == 0 || generation % 2 != 0) return;
-  const SegmentPosition::Chunk from =
-      folded.generation == generation ? folded : SegmentPosition::Chunk{generation, 0};
-  std::uint32_t end = std::min<std::uint32_t>(from.folded, kBHChunkRecords);
-  if (end < kBHChunkRecords) {
-    // First which records exist, then their content.
-    const std::uint64_t first = kBHChunkFirst + std::uint64_t{end} * std::uint64_t{kBHRecordBytes};
-    std::array<std::byte, kBHChunkBytes> bytes;
-    const MutableByteSpan rest = MutableByteSpan(bytes).subspan(first);
-    const auto markAt = [&](std::uint32_t record) {
-      return *loadLittle64(bytes, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes + 8);
-    };
-    file_.read(offset + first, rest);
-    std::uint32_t ready = end;
-    bool isDateMissing = false;
-    for (; ready < kBHChunkRecords; ++ready) {
-      const std::uint64_t mark = markAt(ready);
-      if (mark == 0 && !reading.writerIsGone) break;
-      isDateMissing = isUndated(mark) && !reading.boot;
-      if (isDateMissing) break;
-    }
-    if (isDateMissing) reading.progress.isComplete = false;
-    // Without a writer what was read is whole.
-    if (!reading.writerIsGone) {
-      if (ready > end) file_.read(offset + first, rest);
-      if (file_.word32(offset + kBHChunkGeneration) != generation) {
-        reading.progress.isComplete = false;
-        return;
-      }
-    }
-    DayFinder days;
-    for (; end < ready; ++end) {
-      const std::uint64_t mark = markAt(end);
-      // Only a hostile writer withdraws a mark, or its date.
-      if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
-      const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
-      const auto number = static_cast<std::uint32_t>(mark & 0xffff);
-      const std::string* const key = file_.key(number, kBHKindDistribution);
-      if (key == nullptr || !days.find(secondsOf(time, reading.boot))) {
-        ++reading.progress.refused;
-        continue;
-      }
-      const std::uint64_t bits =
-          *loadLittle64(bytes, kBHChunkFirst + std::uint64_t{end} * kBHRecordBytes);
-      reading.sink.takeRecord(
-          {*key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
-    }
+void SegmentReader::readChunks(Reading& reading, std::uint32_t first, std::uint32_t count) {
+  const std::uint64_t offset = kBHChunks + std::uint64_t{first} * std::uint64_t{kBHChunkBytes};
+  reading.bytes.resize(std::size_t{count} * kBHChunkBytes);
+  const auto bytesOf = [&](std::uint32_t i) {
+    return ByteSpan(reading.bytes).subspan(std::size_t{i} * kBHChunkBytes, kBHChunkBytes);
+  };
+  file_.read(offset, reading.bytes);
+  std::array<ChunkLook, kChunksAtOnce> looks;
+  bool hasNews = false;
+  for (std::uint32_t i = 0; i < count; ++i) {
+    looks[i] = chunkIn(bytesOf(i), reading.position.chunks[first + i], reading.writerIsGone);
+    hasNews = hasNews || looks[i].hasNews;
   }
-  folded = {generation, end};
-  if (end == kBHChunkRecords && !reading.writerIsGone &&
-      file_.word32(offset + kBHChunkAcknowledged) != generation) {
-    reading.progress.acknowledgements.push_back({offset + kBHChunkAcknowledged, generation});
+  // Without a writer what was read is whole. With one, the records of a generation are looked for
+  // after it, and read after they were found.
+  const bool looksAgain = hasNews && !reading.writerIsGone;
+  if (looksAgain) file_.read(offset, reading.bytes);
+  for (std::uint32_t i = 0; i < count; ++i) {
+    if (looks[i].hasNews) findRecords(reading, bytesOf(i), looks[i]);
+  }
+  if (looksAgain) file_.read(offset, reading.bytes);
+  for (std::uint32_t i = 0; i < count; ++i)
+    takeChunk(reading, bytesOf(i), first + i, looks[i]);
+}
+
+// Finds how many records are complete, or dated, one after the other.
+void SegmentReader::findRecords(Reading& reading, ByteSpan bytes, ChunkLook& look) {
+  for (look.ready = look.folded; look.ready < kBHChunkRecords; ++look.ready) {
+    const std::uint64_t mark = markIn(bytes, look.ready);
+    if (mark == 0 && !reading.writerIsGone) break;
+    if (!isUndated(mark) || reading.boot) continue;
+    reading.progress.isComplete = false;
+    break;
+  }
+}
+
+void SegmentReader::takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t index,
+                              const ChunkLook& look) {
+  if (look.generation == 0) return;
+  const std::uint64_t offset = kBHChunks + std::uint64_t{index} * std::uint64_t{kBHChunkBytes};
+  if (look.hasNews && !reading.writerIsGone &&
+      file_.word32(offset + kBHChunkGeneration) != look.generation) {
+    reading.progress.isComplete = false;
+    return;
+  }
+  DayFinder days;
+  for (std::uint32_t record = look.folded; record < look.ready; ++record) {
+    const std::uint64_t mark = markIn(bytes, record);
+    // Only a hostile writer withdraws a mark, or its date.
+    if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
+    const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
+    const auto number = static_cast<std::uint32_t>(mark & 0xffff);
+    const std::string* const key = file_.key(number, kBHKindDistribution);
+    if (key == nullptr || !days.find(secondsOf(time, reading.boot))) {
+      ++reading.progress.refused;
+      continue;
+    }
+    const std::uint64_t bits =
+        *loadLittle64(bytes, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes);
+    reading.sink.takeRecord(
+        {*key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
+  }
+  reading.position.chunks[index] = {look.generation, look.ready};
+  if (look.ready == kBHChunkRecords && !reading.writerIsGone &&
+      look.acknowledged != look.generation) {
+    reading.progress.acknowledgements.push_back({offset + kBHChunkAcknowledged, look.generation});
   }
 }
 

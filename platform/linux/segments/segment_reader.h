@@ -91,10 +91,15 @@ class SegmentReader {
 
  private:
   struct Reading;
+  struct ChunkLook;
 
   void readCells(Reading& reading);
   void readCell(Reading& reading, std::uint32_t index);
-  void readChunk(Reading& reading, std::uint32_t index);
+  void readChunks(Reading& reading, std::uint32_t first, std::uint32_t count);
+  static ChunkLook chunkIn(ByteSpan bytes, const SegmentPosition::Chunk& position,
+                           bool writerIsGone);
+  static void findRecords(Reading& reading, ByteSpan bytes, ChunkLook& look);
+  void takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t index, const ChunkLook& look);
 
   SegmentFile file_;
   int descriptor_;

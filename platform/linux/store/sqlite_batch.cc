@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <utility>
 
-#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/store/distribution_writer.h"
@@ -14,13 +13,10 @@ namespace {
 
 // Rows of either kind held back before they are written, in bytes. They are written in the order of
 // their keys: the more there are, the fewer pages are written twice.
-constexpr std::size_t kPendingBytes = 8U << 20;
+constexpr std::size_t kPendingBytes = 16U << 20;
 
 // A longer log is moved into the database after a commit.
 constexpr off_t kLogBytes = 1 << 20;
-
-// The memory of a waiting distribution, without its records.
-constexpr std::size_t kPendingSeriesBytes = 256;
 
 void checkKey(std::string_view key) {
   if (key.size() <= limits::kStoreKeyBytes) return;
@@ -42,12 +38,6 @@ struct SqliteBatch::Statements {
   SqliteStatement getScalar;
   DistributionWriter distributions;
 };
-
-std::size_t SqliteBatch::HashName::operator()(const SeriesName& name) const {
-  // An odd factor keeps the days of one key apart.
-  return keyedHash(name.key) +
-         static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
-}
 
 SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site)
     : connection_(std::move(connection)), site_(site), kept_(site.path) {
@@ -200,14 +190,13 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
   // As many as wait at most, so that a large span is no exception.
-  constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
+  constexpr std::size_t kAtOnce = kPendingBytes / PendingDistributions::kSampleBytes;
   try {
+    checkKey(key);
     while (!samples.empty()) {
-      const auto taken = samples.first(std::min(samples.size(), kPendingBytes / kSampleBytes));
-      PendingSeries& series = pendingSeries({day, key});
-      appendPacked(series.values, series.offsets, taken);
-      pendingBytes_ += taken.size() * kSampleBytes;
-      if (pendingBytes_ >= kPendingBytes) writeDistributions();
+      const auto taken = samples.first(std::min(samples.size(), kAtOnce));
+      distributions_.append(day, key, taken);
+      if (distributions_.bytes() >= kPendingBytes) writeDistributions();
       samples = samples.subspan(taken.size());
     }
   } catch (const StoreFailure& failure) {
@@ -256,50 +245,26 @@ Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity i
   return Done{};
 }
 
-SqliteBatch::PendingSeries& SqliteBatch::pendingSeries(const SeriesName& name) {
-  if (last_ && last_->first == name) return *last_->second;
-  auto found = pending_.find(name);
-  if (found == pending_.end()) {
-    checkKey(name.key);
-    auto series = std::make_unique<PendingSeries>();
-    series->key = name.key;
-    const SeriesName owned{name.day, series->key};
-    found = pending_.emplace(owned, std::move(series)).first;
-    pendingBytes_ += kPendingSeriesBytes + name.key.size();
-  }
-  last_ = &*found;
-  return *found->second;
-}
-
 void SqliteBatch::writeDistributions() {
-  if (pending_.empty()) return;
+  if (distributions_.empty()) return;
   begin();
   // In the order in which a day is read, so that reads go forward through the file.
-  std::vector<const PendingMap::value_type*> series;
-  series.reserve(pending_.size());
-  for (const auto& entry : pending_)
-    series.push_back(&entry);
-  std::sort(series.begin(), series.end(), [](const auto* a, const auto* b) {
-    return a->first.day != b->first.day ? a->first.day < b->first.day : a->first.key < b->first.key;
-  });
-  for (const auto* entry : series) {
-    const DistributionBlock added{entry->second->values, entry->second->offsets};
-    try {
-      statements_->distributions.append(entry->first.day, entry->first.key, added);
-    } catch (const RowFailure& failure) {
-      if (!refuses_) throw;
-      if (refused_ == 0) {
-        std::string key;
-        appendQuoted(key, entry->first.key.substr(0, 80));
-        site_.tell(failure, "; what was recorded for " + key + " on day " +
-                                std::to_string(entry->first.day) + " is refused");
-      }
-      refused_ += added.values.size() / kPackedValueBytes;
-    }
-  }
-  last_ = nullptr;
-  pending_.clear();
-  pendingBytes_ = 0;
+  distributions_.each(
+      [this](std::int32_t day, std::string_view key, const DistributionBlock& added) {
+        try {
+          statements_->distributions.append(day, key, added);
+        } catch (const RowFailure& failure) {
+          if (!refuses_) throw;
+          if (refused_ == 0) {
+            std::string quoted;
+            appendQuoted(quoted, key.substr(0, 80));
+            site_.tell(failure, "; what was recorded for " + quoted + " on day " +
+                                    std::to_string(day) + " is refused");
+          }
+          refused_ += added.values.size() / kPackedValueBytes;
+        }
+      });
+  distributions_.clear();
 }
 
 Expected<std::uint64_t> SqliteBatch::refusedValues() {

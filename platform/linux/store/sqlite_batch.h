@@ -18,12 +18,12 @@
 #include <span>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "base/expected.h"
 #include "platform/distribution_values.h"
 #include "platform/linux/store/kept_values.h"
+#include "platform/linux/store/pending_distributions.h"
 #include "platform/linux/store/sqlite_connection.h"
 #include "platform/linux/store/sqlite_segments.h"
 #include "platform/linux/store/sqlite_site.h"
@@ -79,21 +79,6 @@ class SqliteBatch {
  private:
   struct Statements;
 
-  // A distribution of a day; the key is borrowed.
-  struct SeriesName {
-    std::int32_t day = 0;
-    std::string_view key;
-    bool operator==(const SeriesName&) const = default;
-  };
-  struct HashName {
-    std::size_t operator()(const SeriesName& name) const;
-  };
-  // Values that wait to be written, packed. Names in the map borrow `key`.
-  struct PendingSeries {
-    std::string key;
-    std::string values;
-    std::string offsets;
-  };
   // A scalar that waits to be written; its key is in `scalarKeys_`.
   struct PendingScalar {
     std::int32_t day;
@@ -101,14 +86,12 @@ class SqliteBatch {
     std::size_t keyStart;
     std::int64_t value;
   };
-  using PendingMap = std::unordered_map<SeriesName, std::unique_ptr<PendingSeries>, HashName>;
 
   void begin();
   void takeKeptValues();
   void setDamagedValuesAside();
   void removeTakenValues();
   void limitLog();
-  PendingSeries& pendingSeries(const SeriesName& name);
   void writeScalars();
   std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
@@ -123,10 +106,7 @@ class SqliteBatch {
   bool begun_ = false;
   std::vector<PendingScalar> scalars_;
   std::string scalarKeys_;
-  PendingMap pending_;
-  std::size_t pendingBytes_ = 0;  // of `pending_`
-  // Values of one distribution often follow each other.
-  const PendingMap::value_type* last_ = nullptr;
+  PendingDistributions distributions_;
   bool refuses_ = false;
   std::uint64_t refused_ = 0;
 };
