@@ -2,6 +2,7 @@
 #include <filesystem>
 #include <gtest/gtest.h>
 
+#include "platform/linux/health/ata_smart.h"
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/nvme_logs.h"
 #include "platform/linux/health/reader.h"
@@ -77,6 +78,61 @@ TEST(HealthTest, RefusesShortAndLyingLogs) {
   put(card, 192, {6});
   EXPECT_EQ(emmcFigures(card).error().message,
             "EXT_CSD revision 6, before eMMC 5.0, has no health");
+}
+
+TEST(HealthTest, OcpFieldsOfALaterVersion) {
+  Bytes page = ocpPage();
+  put(page, 104, {9});
+  put(page, 160, {3});
+  put(page, 192, {0, 1});
+  const auto first = valuesOf(*nvmeOcpFigures(page));
+  EXPECT_EQ(first.at("pcie_errors"), 9);
+  EXPECT_FALSE(first.contains("backup_power_starts"));
+  put(page, 494, {2});
+  const auto second = valuesOf(*nvmeOcpFigures(page));
+  EXPECT_EQ(second.at("backup_power_starts"), 3);
+  EXPECT_EQ(second.at("link_retrains"), 256);
+  EXPECT_FALSE(second.contains("endurance"));  // not reported
+}
+
+// What the drive answered, in the library's form: pieces of a tag and a size, big-endian.
+TEST(HealthTest, AtaSmart) {
+  const auto add = [](Bytes& blob, const char* tag, const Bytes& data) {
+    for (int i = 0; i < 4; ++i)
+      blob.push_back(static_cast<std::byte>(tag[i]));
+    for (int shift = 24; shift >= 0; shift -= 8)
+      blob.push_back(static_cast<std::byte>(data.size() >> shift));
+    blob.insert(blob.end(), data.begin(), data.end());
+  };
+  Bytes identify(512), data(512), thresholds(512);
+  put(identify, 164, {1});  // SMART is there
+  put(identify, 170, {1});  // and on
+  const struct {
+    unsigned id, flags, current, threshold, raw;
+  } attributes[] = {{5, 1, 10, 36, 7},    {9, 0, 90, 0, 50},   {12, 0, 99, 0, 3},
+                    {194, 0, 60, 0, 40},  {197, 0, 100, 0, 2}, {199, 0, 200, 0, 4},
+                    {1, 1, 100, 6, 1000}, {10, 0, 1, 97, 0}};
+  std::size_t at = 2;
+  for (const auto& each : attributes) {
+    put(data, at,
+        {each.id, each.flags, 0, each.current, each.current, each.raw % 256, each.raw / 256});
+    put(thresholds, at, {each.id, each.threshold});
+    at += 12;
+  }
+  Bytes blob;
+  add(blob, "IDFY", identify);
+  add(blob, "SMST", {{}, {}, {}, std::byte{1}});
+  add(blob, "SMDT", data);
+  add(blob, "SMTH", thresholds);
+  const auto figures = ataFigures(blob);
+  ASSERT_TRUE(figures) << figures.error().message;
+  const Values expected = {
+      {"smart_good", 1},      {"temperature", 40'000}, {"power_on_hours", 50},
+      {"power_cycles", 3},    {"bad_sectors", 9},      {"reallocated_sectors", 7},
+      {"pending_sectors", 2}, {"crc_errors", 4},       {"failing_attributes", 1}};
+  EXPECT_EQ(valuesOf(*figures), expected);
+  blob.pop_back();
+  EXPECT_EQ(ataFigures(blob).error().message, "SMART data is malformed");
 }
 
 TEST(HealthTest, FlashLife) {

@@ -170,15 +170,67 @@ constexpr FigureKind kOcp[] = {
      "thermal throttling events; one byte that stays at 255",
      {96, 1}},
     {"free_pct", kPlain, kGauge, "log C0h byte 120", "free blocks", percentage(120)},
+    {"system_used_pct",
+     kPlain,
+     kGauge,
+     "log C0h byte 80",
+     "endurance of the system area used",
+     {80, 1}},
+    {"pcie_errors",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 104-111",
+     "corrected errors of the bus",
+     {104, 8}},
+    {"incomplete_shutdowns",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 112-115",
+     "shutdowns that saved less than all",
+     {112, 4}},
     {"capacitor_pct", kPlain, kGauge, "log C0h byte 128", "health of the backup capacitor",
      percentage(128)},
+    {"unaligned_io",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 136-143",
+     "commands that were not aligned",
+     {136, 8}},
+    // From here on: version 2 of the log.
+    {"backup_power_starts",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 160-175",
+     "times that the drive ran on its capacitor",
+     {160, 16}},
+    {"endurance",
+     kBytes,
+     kGauge,
+     "log C0h bytes 176-191",
+     "what the drive's life is expected to be, in bytes written",
+     {176, 16, 1, true}},
+    {"link_retrains",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 192-199",
+     "retrainings of the bus link",
+     {192, 8}},
+    {"power_state_changes",
+     kEvents,
+     kLifetime,
+     "log C0h bytes 200-207",
+     "changes of power state",
+     {200, 8}},
 };
+
+constexpr std::size_t kOcpOfVersion1 = std::size(kOcp) - 4;
 
 constexpr FigureKind kDerived[] = {
     {"waf_milli", kPlain, kGauge, "logs 02h and C0h",
      "write amplification: media_written / written, in thousandths"},
 };
 
+constexpr std::size_t kOcpVersionOffset = 494;
 constexpr std::size_t kOcpGuidOffset = 496;
 constexpr std::array<std::uint8_t, 16> kOcpGuid = {0xC5, 0xAF, 0x10, 0x28, 0xEA, 0xBF, 0xF2, 0xA4,
                                                    0x9C, 0x4F, 0x6F, 0x7C, 0xC9, 0x14, 0xD5, 0xAF};
@@ -221,7 +273,8 @@ Expected<Figures> nvmeOcpFigures(ByteSpan page) {
       [](std::byte a, std::uint8_t b) { return std::to_integer<std::uint8_t>(a) == b; });
   if (!hasGuid) return Error{"log C0h is not the one of OCP"};
   Figures figures;
-  appendFields(page, kOcp, figures);
+  const bool isFirst = *loadLittle16(page, kOcpVersionOffset) < 2;
+  appendFields(page, std::span(kOcp).first(isFirst ? kOcpOfVersion1 : std::size(kOcp)), figures);
   return figures;
 }
 
