@@ -25,6 +25,8 @@ LIMITS = {
     "statsd: CPU of one datagram, ratio to a bare loop": 1.43,
     "statsd: memory, MiB": 8.0,
     "service: delivery to log, wall ms": 50.0,
+    "live sample: CPU of one value, us": 6.0,
+    "live sample: memory, MiB": 12.0,
 }
 
 

@@ -1,9 +1,10 @@
 #include "platform/linux/health/ata_smart.h"
 
 #include <algorithm>
-#include <atasmart.h>
 #include <limits>
 #include <memory>
+
+#include "platform/linux/health/ata_library.h"
 
 namespace tavrel::health {
 namespace {
@@ -67,25 +68,28 @@ std::span<const FigureKind> ataKinds() {
 }
 
 Expected<Figures> ataFigures(ByteSpan blob) {
+  const auto library = ataLibrary();
+  if (!library) return library.error();
+  const AtaLibrary& ata = **library;
   SkDisk* opened = nullptr;
-  if (sk_disk_open(nullptr, &opened) != 0) return Error{"cannot take SMART data apart"};
-  const std::unique_ptr<SkDisk, decltype(&sk_disk_free)> disk(opened, &sk_disk_free);
+  if (ata.open(nullptr, &opened) != 0) return Error{"cannot take SMART data apart"};
+  const std::unique_ptr<SkDisk, decltype(ata.free)> disk(opened, ata.free);
   Collected collected;
-  if (sk_disk_set_blob(opened, blob.data(), blob.size()) != 0 ||
-      sk_disk_smart_parse_attributes(opened, &takeAttribute, &collected) != 0) {
+  if (ata.set_blob(opened, blob.data(), blob.size()) != 0 ||
+      ata.smart_parse_attributes(opened, &takeAttribute, &collected) != 0) {
     return Error{"SMART data is malformed"};
   }
   SkBool good = FALSE;
-  if (sk_disk_smart_status(opened, &good) == 0) collected.add(kGood, good ? 1U : 0U);
+  if (ata.smart_status(opened, &good) == 0) collected.add(kGood, good ? 1U : 0U);
   std::uint64_t value = 0;
-  if (sk_disk_smart_get_temperature(opened, &value) == 0 && value >= kZeroCelsius) {
+  if (ata.smart_get_temperature(opened, &value) == 0 && value >= kZeroCelsius) {
     collected.add(kTemperature, value - kZeroCelsius);
   }
-  if (sk_disk_smart_get_power_on(opened, &value) == 0) {
+  if (ata.smart_get_power_on(opened, &value) == 0) {
     collected.add(kPowerOn, value / kMillisecondsPerHour);
   }
-  if (sk_disk_smart_get_power_cycle(opened, &value) == 0) collected.add(kPowerCycles, value);
-  if (sk_disk_smart_get_bad(opened, &value) == 0) collected.add(kBad, value);
+  if (ata.smart_get_power_cycle(opened, &value) == 0) collected.add(kPowerCycles, value);
+  if (ata.smart_get_bad(opened, &value) == 0) collected.add(kBad, value);
   collected.add(kFailing, static_cast<std::uint64_t>(collected.failing));
   return std::move(collected.figures);
 }

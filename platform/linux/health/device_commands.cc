@@ -1,6 +1,5 @@
 #include "platform/linux/health/device_commands.h"
 
-#include <atasmart.h>
 #include <fcntl.h>
 #include <linux/mmc/ioctl.h>
 #include <linux/nvme_ioctl.h>
@@ -11,6 +10,7 @@
 #include "base/format.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/system_error.h"
+#include "platform/linux/health/ata_library.h"
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/nvme_logs.h"
 
@@ -79,17 +79,20 @@ Expected<DeviceCommands::Bytes> LinuxDeviceCommands::extCsd(const std::string& p
 }
 
 Expected<DeviceCommands::Bytes> LinuxDeviceCommands::ataSmart(const std::string& path) {
+  const auto library = ataLibrary();
+  if (!library) return library.error();
+  const AtaLibrary& ata = **library;
   SkDisk* opened = nullptr;
-  if (sk_disk_open(path.c_str(), &opened) != 0) return systemError("open", path);
-  const std::unique_ptr<SkDisk, decltype(&sk_disk_free)> disk(opened, &sk_disk_free);
+  if (ata.open(path.c_str(), &opened) != 0) return systemError("open", path);
+  const std::unique_ptr<SkDisk, decltype(ata.free)> disk(opened, ata.free);
   SkBool isAwake = FALSE;
-  if (sk_disk_check_sleep_mode(opened, &isAwake) == 0 && !isAwake) return Bytes{};
-  if (sk_disk_smart_read_data(opened) != 0) return systemError("read SMART data of", path);
+  if (ata.check_sleep_mode(opened, &isAwake) == 0 && !isAwake) return Bytes{};
+  if (ata.smart_read_data(opened) != 0) return systemError("read SMART data of", path);
   SkBool isGood = FALSE;
-  sk_disk_smart_status(opened, &isGood);  // becomes part of the blob
+  ata.smart_status(opened, &isGood);  // becomes part of the blob
   const void* blob = nullptr;
   std::size_t size = 0;
-  if (sk_disk_get_blob(opened, &blob, &size) != 0) return systemError("keep SMART data of", path);
+  if (ata.get_blob(opened, &blob, &size) != 0) return systemError("keep SMART data of", path);
   const auto* const bytes = static_cast<const std::byte*>(blob);
   return Bytes(bytes, bytes + size);
 }
