@@ -55,10 +55,7 @@ static uint32_t takeCell(struct Process* process, struct Segment* segment) {
   uint32_t used = atomic_load(&segment->cellsUsed);
   do {
     if (used >= kBHCellCount * 3 / 4) bhAskForFold(process);
-    if (used >= kBHCellCount || !bhFetch(&segment->cells[used], sizeof(struct Cell))) {
-      atomic_store_explicit(&process->state->isFull, 1, memory_order_relaxed);
-      return 0;
-    }
+    if (used >= kBHCellCount || !bhFetch(&segment->cells[used], sizeof(struct Cell))) return 0;
   } while (!atomic_compare_exchange_weak(&segment->cellsUsed, &used, used + 1));
   return used + 1;
 }
@@ -95,7 +92,7 @@ struct Cell* bhFindCell(struct Key* key) {
   if (cell && atomic_load(&cell->start) == start) return cell;
   cell = findOrMake(process, segment, key, start);
   if (!cell) {
-    bhDrop(segment);
+    bhDrop(process, segment);
     return NULL;
   }
   struct Cell* left = atomic_exchange(&key->cell, cell);

@@ -88,8 +88,8 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
   if (!chunk) chunk = takeFresh(state, segment);
   const int32_t free = atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) +
                        kBHChunkCount - (int32_t)usedChunks(segment);
-  if (!chunk || free < kBHChunkCount / 4) bhAskForFold(process);
-  atomic_store_explicit(&state->isFull, chunk == NULL, memory_order_relaxed);
+  if (free < kBHChunkCount / 4) bhAskForFold(process);
+  if (chunk) atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
   return chunk;
 }
 
@@ -120,5 +120,5 @@ void bhRecordSlowly(struct Key* key, double value) {
       atomic_store(&process->state->spareChunk, fresh);
     }
   }
-  bhDrop(segment);
+  bhDrop(process, segment);
 }

@@ -33,7 +33,8 @@ struct Segment* bhSegment(struct Process* process);
 /* Fetches memory, so that a full tmpfs shows here and not as SIGBUS. */
 bool bhFetch(const void* from, size_t bytes);
 void bhAskForFold(struct Process* process);
-void bhDrop(struct Segment* segment);
+/* Counts a value for which there is no room. */
+void bhDrop(struct Process* process, struct Segment* segment);
 
 /* segment_file.c */
 

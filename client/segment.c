@@ -44,7 +44,9 @@ void bhAskForFold(struct Process* process) {
   }
 }
 
-void bhDrop(struct Segment* segment) {
+void bhDrop(struct Process* process, struct Segment* segment) {
+  atomic_store_explicit(&process->state->isFull, 1, memory_order_relaxed);
+  bhAskForFold(process);
   atomic_fetch_add_explicit(&segment->dropped, 1, memory_order_relaxed);
 }
 

@@ -576,6 +576,26 @@ TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
   expectEachOnce(1);
 }
 
+TEST_F(FoldTest, AProgramNoticesThatAFullFileSystemHasRoomAgain) {
+  if (mount("test", folder.c_str(), "tmpfs", 0, "size=4k") != 0) GTEST_SKIP() << "not root";
+  const pid_t child = start([] {
+    for (const BHClientStatus status : {BHClientStatusFull, BHClientStatusRecording}) {
+      add(1);
+      EXPECT_EQ(BHClientGetStatus(nullptr), status);
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  waitpid(child, nullptr, WUNTRACED);
+  EXPECT_TRUE(std::filesystem::exists(folder / "fold-wanted"));
+  EXPECT_EQ(mount("test", folder.c_str(), "tmpfs", MS_REMOUNT, "size=64k"), 0);
+  EXPECT_EQ(foldNow().dropped, 1U);
+  kill(child, SIGCONT);
+  waitpid(child, nullptr, WUNTRACED);
+  kill(child, SIGCONT);
+  EXPECT_EQ(waitFor(child), 0);
+  umount(folder.c_str());
+}
+
 TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
   run([] { add(1); });
   const auto opened = SegmentFolder::open(DeviceRoot(root));

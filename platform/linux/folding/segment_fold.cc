@@ -229,7 +229,8 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   counts_.refused += intake.refused() + progress.refused;
   counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
   const bool isOver = isWriterGone && progress.isComplete;
-  if (isOver || !progress.acknowledgements.empty()) {
+  // A program that dropped values learns that there may be room again.
+  if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
     folded_.push_back({name, std::move(segment), std::move(progress), isOver});
   }
   return Done{};
