@@ -9,8 +9,8 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
   outputOf("cmake --install " TAVREL_BUILD " --component brimhold --prefix " + to);
   const std::string pc = outputOf("find " + to + " -name brimhold.pc");
   const std::string lib = std::filesystem::path(pc).parent_path().parent_path();
-  std::string flags = outputOf("PKG_CONFIG_PATH=" + lib +
-                               "/pkgconfig pkg-config --define-prefix --cflags --libs brimhold");
+  std::string flags =
+      outputOf("PKG_CONFIG_PATH=" + lib + "/pkgconfig pkg-config --cflags --libs brimhold");
   flags.pop_back();
   flags += " -Wall -Wextra -Wpedantic -Werror " TAVREL_LINK_FLAGS;
   outputOf("cc -std=c11 " + examples + "/record.c -o " + to + "/c " + flags);
