@@ -52,6 +52,7 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   device.write("/var", "");
   const Outcome failed = device.run("stat fold");
   EXPECT_EQ(failed.status, 1);
+  EXPECT_EQ(failed.out, "");
   EXPECT_NE(failed.error.find("; what programs recorded waits for the next fold\n"),
             std::string::npos)
       << failed;

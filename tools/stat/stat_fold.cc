@@ -22,7 +22,7 @@ void foldStatistics(ToolContext& context) {
                        {"segments_refused", report.segmentsRefused}});
   } else if (!report.hasFolder && !report.failure) {
     context.out() << "nothing to fold: the device has no folder /run/tavrel/stat\n";
-  } else if (report.hasFolder) {
+  } else if (report.hasFolder && (!report.failure || report.segments > 0)) {
     std::ostream& out = context.out();
     out << counted(report.segments, "segment") << ": " << counted(report.scalars, "scalar") << ", "
         << counted(report.values, "value") << "; " << report.removed << " removed";
