@@ -72,8 +72,8 @@ static const char* textOf(BHClientStatus status) {
     case BHClientStatusFull:
       return "the segment is full: values are dropped until the next fold";
     case BHClientStatusKeyRefused:
-      return "values are recorded, but not those of a key that was refused: empty, longer than "
-             "1024 bytes, with control characters, or one too many";
+      return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
+             "bytes, has control characters, or is one more than a process may have";
   }
   return "unknown status";
 }

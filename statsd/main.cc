@@ -21,13 +21,13 @@ constexpr const char* kHelp =
     "Usage: tavrel-statsd [OPTIONS]\n"
     "Records counters, gauges, timers and histograms that programs send as StatsD datagrams.\n"
     "\n"
-    "  --udp PORT      listen at 127.0.0.1:PORT (default 8125 when no socket is given)\n"
-    "  --unix PATH     listen at a Unix datagram socket\n"
+    "  --udp PORT      listen on 127.0.0.1:PORT (default 8125 when no socket is given)\n"
+    "  --unix PATH     listen on a Unix datagram socket\n"
     "  --prefix TEXT   begin each key with TEXT (default \"statsd.\")\n"
-    "  --idle SECONDS  end after so long without a datagram; 0 is never (default 60)\n"
+    "  --idle SECONDS  exit after this time without a datagram; 0 means never (default 60)\n"
     "  --help, --version\n"
     "\n"
-    "Sockets of the service manager take the place of --udp and --unix. See tavrel-statsd(8).\n";
+    "Sockets that the service manager passes replace --udp and --unix. See tavrel-statsd(8).\n";
 
 struct Options {
   std::vector<std::uint16_t> ports;
@@ -95,7 +95,7 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
         return 2;
     }
   }
-  if (optind < argc) return misuse(format("no argument '%s': see --help", argv[optind]));
+  if (optind < argc) return misuse(format("unexpected argument '%s': see --help", argv[optind]));
   return std::nullopt;
 }
 

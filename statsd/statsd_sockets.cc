@@ -119,12 +119,12 @@ Expected<std::vector<DatagramSocket>> activatedDatagramSockets() {
   const auto count = numberFromEnvironment("LISTEN_FDS");
   if (!process || *process != getpid() || !count) return sockets;
   if (*count > kMostSockets) {
-    return Error{format("LISTEN_FDS hands over %d sockets: at most %d", *count, kMostSockets)};
+    return Error{format("LISTEN_FDS passes %d sockets: pass at most %d", *count, kMostSockets)};
   }
   for (int descriptor = kFirstDescriptor; descriptor < kFirstDescriptor + *count; ++descriptor) {
     if (!isDatagramSocket(descriptor)) {
       return Error{
-          format("descriptor %d of LISTEN_FDS is no datagram socket: use "
+          format("descriptor %d of LISTEN_FDS is not a datagram socket: use "
                  "ListenDatagram= in the socket unit",
                  descriptor)};
     }
@@ -141,7 +141,7 @@ Expected<DatagramSocket> openLoopbackSocket(std::uint16_t port) {
   address.sin_port = htons(port);
   address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
   if (!bindTo(made.descriptor(), address)) {
-    return failure(format("cannot listen at UDP port %u", unsigned{port}).c_str());
+    return failure(format("cannot listen on UDP port %u", unsigned{port}).c_str());
   }
   return made;
 }
@@ -150,7 +150,7 @@ Expected<DatagramSocket> openUnixSocket(const std::string& path) {
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   if (path.empty() || path.size() >= sizeof address.sun_path) {
-    return Error{format("cannot listen at %s: give a path of at most %zu bytes", path,
+    return Error{format("cannot listen on %s: give a path of at most %zu bytes", path,
                         sizeof address.sun_path - 1)};
   }
   path.copy(address.sun_path, path.size());
@@ -160,7 +160,7 @@ Expected<DatagramSocket> openUnixSocket(const std::string& path) {
     unlink(address.sun_path);
     isBound = bindTo(made.descriptor(), address);
   }
-  if (!isBound) return failure(format("cannot listen at %s", path).c_str());
+  if (!isBound) return failure(format("cannot listen on %s", path).c_str());
   chmod(address.sun_path, 0666);
   return made;
 }

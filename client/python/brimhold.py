@@ -11,8 +11,8 @@
         work()
 
 A scalar is a number per UTC day: add to it, or set it. A distribution is a series of measurements.
-Recording never fails and never raises for what the device lacks: `status()` says whether values are
-kept. It raises what is a mistake of the program: a key that is none, a number out of range.
+Recording never fails, whatever the device lacks: `status()` says whether values are kept. Only
+mistakes of the program raise: an invalid key, a number out of range.
 
 The module needs the shared library libbrimhold.so.1 and nothing else. BRIMHOLD_LIBRARY in the
 environment names another file.

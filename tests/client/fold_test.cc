@@ -402,7 +402,7 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
     put(std::to_string(i).c_str(), 0);
   EXPECT_EQ(foldNow().segmentsRefused, 200U);
   EXPECT_EQ(log.lines.size(), 100U - 7 + 1);  // with those of the fold before
-  EXPECT_EQ(log.lines.back(), "107 more refusals of this fold are not told");
+  EXPECT_EQ(log.lines.back(), "107 more refusals of this fold are not listed");
 }
 
 TEST_F(FoldTest, RandomBytesDoNoHarm) {

@@ -137,24 +137,24 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
     fold();
   EXPECT_EQ(scalars.begin()->first.first, "own");
 
-  const std::string taken = "cannot listen at " + path + ": Address already in use\n";
+  const std::string taken = "cannot listen on " + path + ": Address already in use\n";
   const std::tuple<std::string, int, std::string> cases[] = {
       {"--unix " + path, 1, taken},
       {"--unix /x/" + std::string(106, 'x'), 1,
-       "cannot listen at /x/" + std::string(106, 'x') + ": give a path of at most 107 bytes\n"},
-      {"--unix /dev/null/x", 1, "cannot listen at /dev/null/x: Not a directory\n"},
+       "cannot listen on /x/" + std::string(106, 'x') + ": give a path of at most 107 bytes\n"},
+      {"--unix /dev/null/x", 1, "cannot listen on /dev/null/x: Not a directory\n"},
       {"--udp 0", 2, "not a port: 0: give 1 to 65535\n"},
       {"--udp 65536", 2, "not a port: 65536: give 1 to 65535\n"},
       {"--prefix 'a b'", 2,
        "not a prefix: a b: give letters, digits, '.', '_' and '-', at most 200\n"},
       {"--idle 86401", 2, "not a time: 86401: give 0 to 86400 seconds\n"},
-      {"x", 2, "no argument 'x': see --help\n"}};
+      {"x", 2, "unexpected argument 'x': see --help\n"}};
   for (const auto& [options, status, message] : cases)
     EXPECT_EQ(outputOf(kProgram + " " + options, status), "tavrel-statsd: " + message);
   EXPECT_EQ(
       outputOf("exec 3</dev/null; LISTEN_FDS=1 exec sh -c 'LISTEN_PID=$$ exec " + kProgram + "'",
                1),
-      "tavrel-statsd: descriptor 3 of LISTEN_FDS is no datagram socket: use ListenDatagram= "
+      "tavrel-statsd: descriptor 3 of LISTEN_FDS is not a datagram socket: use ListenDatagram= "
       "in the socket unit\n");
   kill(child, SIGTERM);
   EXPECT_EQ(waitFor(child), SIGTERM);

@@ -10,7 +10,7 @@
  * Purpose. A scalar is a number per UTC day: counts are added, gauges are set. A distribution is a
  * series of measurements, each kept with its second. The system folds what programs record into
  * its statistics store, every hour and when a segment fills up, and reports what its whitelist
- * names. `tavrelctl stat show KEY` shows a value at once.
+ * names. `tavrelctl stat show KEY` shows a value right away.
  *
  * Cost. An add or a record is a few nanoseconds: a clock read and an atomic add in memory. There
  * is no daemon, no lock and no write to flash. A process that records takes 20 KiB of memory, and
@@ -52,10 +52,10 @@ extern "C" {
 typedef struct BHClientScalarKey BHClientScalarKey;
 typedef struct BHClientDistributionKey BHClientDistributionKey;
 
-/* Looks a key up; the same name gives the same handle. The name is copied. Never returns NULL: a
- * key that is NULL, empty, longer than 1024 bytes, has control characters or is one too many (4096
- * per process) gets a handle whose values are dropped. The other calls accept NULL, and drop the
- * value. */
+/* Looks a key up; the same name gives the same handle. The name is copied. Never returns NULL: the
+ * values of a refused key are dropped. A key is refused when it is NULL, empty or longer than 1024
+ * bytes, has control characters, or the process has 4096 keys already. The other calls accept NULL,
+ * and drop the value. */
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 

@@ -58,7 +58,7 @@ timespec FoldNotes::lastMark(const DeviceRoot& root) {
 
 void FoldNotes::save() {
   if (leftOut_ > 0) {
-    log_.log(LogLevel::Error, "%llu more refusals of this fold are not told", leftOut_);
+    log_.log(LogLevel::Error, "%llu more refusals of this fold are not listed", leftOut_);
   }
   if (!hasChanged_) return;
   std::string content;
@@ -68,7 +68,7 @@ void FoldNotes::save() {
     content += asText(bytes);
   }
   if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
-    log_.log(LogLevel::Error, "cannot write %s: refusals will be told again", kLockPath);
+    log_.log(LogLevel::Error, "cannot write %s: refusals will be logged again", kLockPath);
   }
 }
 
