@@ -1,17 +1,19 @@
 #include "platform/linux/segments/segment_position.h"
 
+#include <algorithm>
+
 #include "base/bytes.h"
 #include "client/segment_format.h"
 
 namespace tavrel {
 namespace {
 
-// Layout, little-endian: u32 version, u32 cells, u32 chunks, u32 zero, u64 dropped, then the cells
-// and the chunks with their fields in order.
-constexpr std::uint32_t kVersion = 1;
+// Layout, little-endian: u32 version, u32 cells, u32 chunks, u32 zero, u64 dropped, then the used
+// cells and chunks, each as its u32 number, which ascend, and its fields in order.
+constexpr std::uint32_t kVersion = 2;
 constexpr std::uint64_t kHeadBytes = 24;
-constexpr std::uint64_t kCellBytes = 16;
-constexpr std::uint64_t kChunkBytes = 8;
+constexpr std::uint64_t kCellBytes = 20;
+constexpr std::uint64_t kChunkBytes = 12;
 
 template <class Word>
 void append(std::string& out, Word word) {
@@ -19,21 +21,44 @@ void append(std::string& out, Word word) {
     out += static_cast<char>(static_cast<unsigned char>(word >> (8 * i)));
 }
 
+template <class Part>
+std::uint32_t countUsed(const std::vector<Part>& parts) {
+  return static_cast<std::uint32_t>(parts.size()) -
+         static_cast<std::uint32_t>(std::count(parts.begin(), parts.end(), Part{}));
+}
+
+// Room for the part with the number at `at`, behind all others; nothing when it has none.
+template <class Part>
+Part* nextPart(std::vector<Part>& parts, ByteSpan bytes, std::uint64_t at, std::uint32_t limit) {
+  const std::uint32_t number = *loadLittle32(bytes, at);
+  if (number < parts.size() || number >= limit) return nullptr;
+  parts.resize(number + 1);
+  return &parts.back();
+}
+
 }  // namespace
 
 std::string SegmentPosition::encode() const {
+  const std::uint32_t usedCells = countUsed(cells);
+  const std::uint32_t usedChunks = countUsed(chunks);
   std::string out;
-  out.reserve(kHeadBytes + cells.size() * kCellBytes + chunks.size() * kChunkBytes);
+  out.reserve(kHeadBytes + usedCells * kCellBytes + usedChunks * kChunkBytes);
   append(out, kVersion);
-  append(out, static_cast<std::uint32_t>(cells.size()));
-  append(out, static_cast<std::uint32_t>(chunks.size()));
+  append(out, usedCells);
+  append(out, usedChunks);
   append(out, std::uint32_t{0});
   append(out, dropped);
-  for (const Cell& cell : cells) {
+  for (std::uint32_t number = 0; number < cells.size(); ++number) {
+    const Cell& cell = cells[number];
+    if (cell == Cell{}) continue;
+    append(out, number);
     append(out, cell.sets);
     append(out, static_cast<std::uint64_t>(cell.value));
   }
-  for (const Chunk& chunk : chunks) {
+  for (std::uint32_t number = 0; number < chunks.size(); ++number) {
+    const Chunk& chunk = chunks[number];
+    if (chunk == Chunk{}) continue;
+    append(out, number);
     append(out, chunk.generation);
     append(out, chunk.folded);
   }
@@ -41,22 +66,29 @@ std::string SegmentPosition::encode() const {
 }
 
 Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
+  const Error refused{"not the position of a segment"};
   const ByteSpan bytes = asBytes(text);
-  const std::uint32_t cells = loadLittle32(bytes, 4).value_or(0);
-  const std::uint32_t chunks = loadLittle32(bytes, 8).value_or(0);
-  if (loadLittle32(bytes, 0) != kVersion || cells > kBHCellCount || chunks > kBHChunkCount ||
-      bytes.size() != kHeadBytes + cells * kCellBytes + chunks * kChunkBytes) {
-    return Error{"not the position of a segment"};
+  const std::uint32_t usedCells = loadLittle32(bytes, 4).value_or(0);
+  const std::uint32_t usedChunks = loadLittle32(bytes, 8).value_or(0);
+  if (loadLittle32(bytes, 0) != kVersion || usedCells > kBHCellCount ||
+      usedChunks > kBHChunkCount ||
+      bytes.size() != kHeadBytes + usedCells * kCellBytes + usedChunks * kChunkBytes) {
+    return refused;
   }
   SegmentPosition position;
   position.dropped = *loadLittle64(bytes, 16);
   std::uint64_t at = kHeadBytes;
-  for (std::uint32_t i = 0; i < cells; ++i, at += kCellBytes) {
-    position.cells.push_back(
-        {*loadLittle64(bytes, at), static_cast<std::int64_t>(*loadLittle64(bytes, at + 8))});
+  for (std::uint32_t i = 0; i < usedCells; ++i, at += kCellBytes) {
+    Cell* const cell = nextPart(position.cells, bytes, at, kBHCellCount);
+    if (cell == nullptr) return refused;
+    *cell = {*loadLittle64(bytes, at + 4),
+             static_cast<std::int64_t>(*loadLittle64(bytes, at + 12))};
   }
-  for (std::uint32_t i = 0; i < chunks; ++i, at += kChunkBytes)
-    position.chunks.push_back({*loadLittle32(bytes, at), *loadLittle32(bytes, at + 4)});
+  for (std::uint32_t i = 0; i < usedChunks; ++i, at += kChunkBytes) {
+    Chunk* const chunk = nextPart(position.chunks, bytes, at, kBHChunkCount);
+    if (chunk == nullptr) return refused;
+    *chunk = {*loadLittle32(bytes, at + 4), *loadLittle32(bytes, at + 8)};
+  }
   return position;
 }
 

@@ -1,8 +1,8 @@
 // How far a segment has been folded: what a store remembers with the values that it took, so that
 // each is taken once.
 //
-// The bytes of a position hold only what was used of the segment: 16 bytes per cell and 8 per
-// chunk, at most 138 KB.
+// The bytes of a position hold only what was folded of the segment, 20 bytes per cell and 12 per
+// chunk, whatever its header claims: nobody fills the store with positions of empty segments.
 #pragma once
 
 #include <cstdint>
@@ -35,7 +35,7 @@ struct SegmentPosition {
   bool operator==(const SegmentPosition&) const = default;
 
   std::string encode() const;
-  /// Refuses bytes that `encode` did not write.
+  /// Without unused parts at the ends. Refuses bytes that `encode` did not write.
   static Expected<SegmentPosition> decode(std::string_view bytes);
 };
 

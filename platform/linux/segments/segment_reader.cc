@@ -126,6 +126,13 @@ bool awaitsAcknowledgement(const CellLook& look) {
   return look.closes % 2 != 0 && look.acknowledged != look.closes;
 }
 
+// What a header claims to be used is not remembered until it is.
+template <class Part>
+void dropUnused(std::vector<Part>& parts) {
+  while (!parts.empty() && parts.back() == Part{})
+    parts.pop_back();
+}
+
 }  // namespace
 
 BootInstant currentBootInstant() {
@@ -201,6 +208,8 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
   if (position.chunks.size() < chunks) position.chunks.resize(chunks);
   for (std::uint32_t first = 0; first < chunks; first += kChunksAtOnce)
     readChunks(reading, first, std::min(kChunksAtOnce, chunks - first));
+  dropUnused(position.cells);
+  dropUnused(position.chunks);
   return std::move(reading.progress);
 }
 
