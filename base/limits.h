@@ -188,4 +188,19 @@ inline constexpr int kSensorsMilliseconds = 4'000;
 /// Sensors that may keep a thread waiting at one time. Each of them costs the stack of a thread.
 inline constexpr int kWaitingSensors = 4;
 
+/// Seconds until the uploader tries again after a failure; each further one doubles them. The
+/// longest pause, which also bounds what a server may ask for and what the configuration may say.
+inline constexpr double kUploadPauseSeconds = 600;
+inline constexpr std::int64_t kLongestUploadPauseSeconds = 86'400;
+
+/// Bytes of a header of the uploader. Servers take some 8 KiB in a line.
+inline constexpr std::size_t kUploadHeaderBytes = 4'096;
+
+/// Bytes of the body of a server's answer, of which nothing is used.
+inline constexpr std::size_t kUploadAnswerBytes = 64U << 10;
+
+/// Logs that a server refused and that are kept to be looked at, and their bytes together.
+inline constexpr std::size_t kRefusedLogs = 16;
+inline constexpr std::uint64_t kRefusedBytes = 4U << 20;
+
 }  // namespace tavrel::limits

@@ -1,0 +1,129 @@
+#include "upload/connection.h"
+
+#include <algorithm>
+#include <array>
+#include <curl/curl.h>
+#include <new>
+
+#include "base/limits.h"
+#include "base/version.h"
+
+namespace tavrel::upload {
+namespace {
+
+// Below this many bytes a second a transfer stalls.
+constexpr long kSlowest = 100;
+
+template <class Argument>
+void set(CURL* handle, CURLoption option, Argument argument) {
+  if (curl_easy_setopt(handle, option, argument) == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
+}
+
+void setText(CURL* handle, CURLoption option, const std::string& text) {
+  if (!text.empty()) set(handle, option, text.c_str());
+}
+
+std::string headerOf(CURL* handle, const char* name) {
+  curl_header* header = nullptr;
+  if (curl_easy_header(handle, name, 0, CURLH_HEADER, -1, &header) != CURLHE_OK) return {};
+  return header->value;
+}
+
+}  // namespace
+
+// What the callbacks of one transfer share.
+struct Connection::Transfer {
+  const GoOn& goOn;
+  std::chrono::steady_clock::time_point asked;
+  std::size_t answerBytes = 0;
+
+  static std::size_t takeBody(char*, std::size_t size, std::size_t count, void* context) {
+    Transfer& transfer = *static_cast<Transfer*>(context);
+    transfer.answerBytes += size * count;
+    return transfer.answerBytes <= limits::kUploadAnswerBytes ? size * count : 0;
+  }
+
+  static int progress(void* context, curl_off_t, curl_off_t, curl_off_t, curl_off_t) {
+    Transfer& transfer = *static_cast<Transfer*>(context);
+    const auto now = std::chrono::steady_clock::now();
+    if (now - transfer.asked < std::chrono::seconds(1)) return 0;
+    transfer.asked = now;
+    return transfer.goOn() ? 0 : 1;
+  }
+};
+
+Connection::Connection(const Configuration& configuration)
+    : configuration_(configuration), handle_(nullptr, curl_easy_cleanup) {
+  if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
+  handle_.reset(curl_easy_init());
+  CURL* const handle = handle_.get();
+  if (handle == nullptr) throw std::bad_alloc();
+  // A look-up of a name that hangs is left behind, not waited for.
+  set(handle, CURLOPT_QUICK_EXIT, 1L);
+  set(handle, CURLOPT_PROTOCOLS_STR, configuration.mayBePlain ? "https,http" : "https");
+  set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
+  set(handle, CURLOPT_FOLLOWLOCATION, 0L);
+  set(handle, CURLOPT_PROXY, "");
+  set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
+  setText(handle, CURLOPT_CAINFO, configuration.authority);
+  setText(handle, CURLOPT_SSLCERT, configuration.certificate);
+  setText(handle, CURLOPT_SSLKEY, configuration.key);
+  set(handle, CURLOPT_CONNECTTIMEOUT, static_cast<long>(configuration.connect.count()));
+  set(handle, CURLOPT_LOW_SPEED_LIMIT, kSlowest);
+  set(handle, CURLOPT_LOW_SPEED_TIME, static_cast<long>(configuration.stall.count()));
+  set(handle, CURLOPT_USERAGENT, ("tavrel-upload/" + std::string(version())).c_str());
+  set(handle, CURLOPT_CUSTOMREQUEST, "PUT");
+  set(handle, CURLOPT_WRITEFUNCTION, Transfer::takeBody);
+  set(handle, CURLOPT_XFERINFOFUNCTION, Transfer::progress);
+  set(handle, CURLOPT_NOPROGRESS, 0L);
+}
+
+Connection::~Connection() {
+  handle_.reset();
+  curl_global_cleanup();
+}
+
+Expected<Answer> Connection::put(const std::string& url, const std::vector<std::string>& headers,
+                                 std::string_view body, std::chrono::milliseconds longest,
+                                 const GoOn& goOn) {
+  CURL* const handle = handle_.get();
+  std::unique_ptr<curl_slist, void (*)(curl_slist*)> list(nullptr, curl_slist_free_all);
+  const auto add = [&](const std::string& header) {
+    curl_slist* const longer = curl_slist_append(list.get(), header.c_str());
+    if (longer == nullptr) throw std::bad_alloc();
+    if (!list) list.reset(longer);
+  };
+  add("Content-Type: application/octet-stream");
+  add("Content-Encoding: gzip");
+  if (!configuration_.token.empty()) add("Authorization: Bearer " + configuration_.token);
+  for (const std::string& header : headers)
+    add(header);
+
+  Transfer transfer{goOn, std::chrono::steady_clock::now()};
+  std::array<char, CURL_ERROR_SIZE> words{};
+  set(handle, CURLOPT_URL, url.c_str());
+  set(handle, CURLOPT_HTTPHEADER, list.get());
+  set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
+  set(handle, CURLOPT_POSTFIELDS, body.data());
+  set(handle, CURLOPT_TIMEOUT_MS, static_cast<long>(longest.count()));
+  set(handle, CURLOPT_WRITEDATA, &transfer);
+  set(handle, CURLOPT_XFERINFODATA, &transfer);
+  set(handle, CURLOPT_ERRORBUFFER, words.data());
+  const CURLcode code = curl_easy_perform(handle);
+  set(handle, CURLOPT_ERRORBUFFER, static_cast<char*>(nullptr));
+  if (transfer.answerBytes > limits::kUploadAnswerBytes) return Error{"the answer is too long"};
+  if (code != CURLE_OK) return Error{words[0] != '\0' ? words.data() : curl_easy_strerror(code)};
+
+  Answer answer;
+  curl_off_t seconds = 0;
+  const char* location = nullptr;
+  curl_easy_getinfo(handle, CURLINFO_RESPONSE_CODE, &answer.status);
+  if (curl_easy_getinfo(handle, CURLINFO_RETRY_AFTER, &seconds) == CURLE_OK)
+    answer.retryAfter = std::clamp<curl_off_t>(seconds, 0, limits::kLongestUploadPauseSeconds);
+  if (curl_easy_getinfo(handle, CURLINFO_REDIRECT_URL, &location) == CURLE_OK && location)
+    answer.location = location;
+  answer.received = headerOf(handle, kReceivedHeader);
+  return answer;
+}
+
+}  // namespace tavrel::upload

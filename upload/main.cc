@@ -1,0 +1,103 @@
+// tavrel-upload: sends the logs that wait to a server, once.
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+#include <getopt.h>
+#include <string>
+
+#include "base/version.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/process/linux_clock.h"
+#include "platform/linux/system_log/linux_system_log.h"
+#include "platform/plist/coding.h"
+#include "upload/uploader.h"
+
+namespace tavrel::upload {
+namespace {
+
+// For scripts and units; tavrel-upload(8) lists them. The last two are those of sysexits.h.
+enum ExitStatus : int { kDone = 0, kFailed = 1, kMisused = 2, kWaits = 75, kMisconfigured = 78 };
+
+constexpr const char* kHelp =
+    "Usage: tavrel-upload [--now]\n"
+    "Sends the logs that wait for submission to the server that /etc/tavrel/upload.plist names.\n"
+    "\n"
+    "  --now  do not wait for the time of the next attempt after a failure\n"
+    "  --help, --version\n"
+    "\n"
+    "See tavrel-upload(8).\n";
+
+int upload(SystemLog& log, bool atOnce) {
+  const DeviceRoot root = DeviceRoot::fromEnvironment();
+  if (const Status usable = root.check(); !usable) {
+    log.log(LogLevel::Error, "%s: name the device's folder with TAVREL_ROOT",
+            usable.error().message);
+    return kFailed;
+  }
+  FileSystem files;
+  plist::PlistCoding propertyLists;
+  LinuxClock clock;
+  FilePreferences preferences(root, files, propertyLists, clock, log);
+  LinuxSystemVersion systemVersion(root, files, propertyLists, log);
+  FileSubmission submission(root, files, propertyLists, preferences, systemVersion, clock, log);
+
+  const char* const credentials = std::getenv("CREDENTIALS_DIRECTORY");
+  const auto configuration =
+      readConfiguration(root, files, propertyLists, credentials ? credentials : "");
+  if (!configuration) {
+    log.write(LogLevel::Error, configuration.error().message);
+    return kMisconfigured;
+  }
+  Uploader uploader({root, files, propertyLists, preferences, submission, clock, log},
+                    *configuration);
+  switch (uploader.run(atOnce)) {
+    case Outcome::Done:
+      return kDone;
+    case Outcome::Waits:
+      return kWaits;
+    case Outcome::Failed:
+      break;
+  }
+  return kFailed;
+}
+
+int run(int argc, char** argv) {
+  constexpr option kOptions[] = {{"now", no_argument, nullptr, 'n'},
+                                 {"help", no_argument, nullptr, 'h'},
+                                 {"version", no_argument, nullptr, 'v'},
+                                 {nullptr, 0, nullptr, 0}};
+  bool atOnce = false;
+  for (int found = 0; (found = getopt_long(argc, argv, "h", kOptions, nullptr)) != -1;) {
+    switch (found) {
+      case 'n':
+        atOnce = true;
+        break;
+      case 'h':
+        std::fputs(kHelp, stdout);
+        return kDone;
+      case 'v':
+        std::printf("tavrel-upload %s\n", std::string(version()).c_str());
+        return kDone;
+      default:
+        return kMisused;
+    }
+  }
+  if (optind < argc) {
+    std::fprintf(stderr, "tavrel-upload: no argument '%s': see --help\n", argv[optind]);
+    return kMisused;
+  }
+  LinuxSystemLog log;
+  try {
+    return upload(log, atOnce);
+  } catch (const std::exception& error) {
+    log.log(LogLevel::Error, "upload ended early: %s", error.what());
+  }
+  return kFailed;
+}
+
+}  // namespace
+}  // namespace tavrel::upload
+
+int main(int argc, char** argv) {
+  return tavrel::upload::run(argc, argv);
+}

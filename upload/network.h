@@ -1,0 +1,17 @@
+// Whether there is a network that may be used, by the kernel's tables of routes.
+#pragma once
+
+#include <string>
+
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "upload/configuration.h"
+
+namespace tavrel::upload {
+
+/// Why nothing may be sent now, such as "there is no default route"; empty when it may. A server on
+/// this machine can always be reached.
+std::string reasonToWait(const DeviceRoot& root, FileSystem& files,
+                         const Configuration& configuration);
+
+}  // namespace tavrel::upload

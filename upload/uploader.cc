@@ -1,0 +1,287 @@
+#include "upload/uploader.h"
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstdint>
+#include <cstring>
+#include <fcntl.h>
+#include <sys/file.h>
+
+#include "base/format.h"
+#include "base/iso_date.h"
+#include "base/limits.h"
+#include "base/version.h"
+#include "platform/linux/files/random.h"
+#include "platform/linux/files/system_error.h"
+#include "platform/linux/logs/log_file_name.h"
+#include "platform/persisted_state.h"
+#include "upload/headers.h"
+#include "upload/network.h"
+
+namespace tavrel::upload {
+namespace {
+
+constexpr const char* kLockPath = "/var/lib/tavrel/upload/lock";
+
+double chance() {
+  std::array<std::byte, sizeof(std::uint32_t)> bytes{};
+  fillRandom(bytes);
+  std::uint32_t number = 0;
+  std::memcpy(&number, bytes.data(), sizeof number);
+  return number / 4294967295.0;
+}
+
+// Names that the system gives, which are safe in addresses and on the server's disk.
+bool isPlain(std::string_view name) {
+  return parseLogFileName(name) && std::all_of(name.begin(), name.end(), [](char c) {
+           return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
+                  c == '-' || c == '_' || c == '.';
+         });
+}
+
+}  // namespace
+
+Uploader::Uploader(const Services& services, const Configuration& configuration)
+    : services_(services),
+      configuration_(configuration),
+      outbox_(services.root, services.files),
+      statePath_(services.root.path(kStatePath)) {}
+
+Uploader::Permission Uploader::permission() {
+  // Read anew: whoever withdraws it is another process.
+  services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
+  bool isThere = false;
+  const bool isOn = services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey,
+                                                                     kDiagnosticsDomain, &isThere);
+  if (isOn) return Permission::Given;
+  return isThere ? Permission::Withdrawn : Permission::NotGiven;
+}
+
+std::chrono::milliseconds Uploader::timeLeft() const {
+  return std::chrono::duration_cast<std::chrono::milliseconds>(
+      configuration_.run - (std::chrono::steady_clock::now() - begin_));
+}
+
+void Uploader::complain(std::string_view line) {
+  services_.log.write(LogLevel::Error, line);
+  hasComplained_ = true;
+}
+
+Outcome Uploader::run(bool atOnce) {
+  const std::string path = services_.root.path(kLockPath);
+  if (Status made = services_.files.makeFolders(path.substr(0, path.rfind('/'))); !made) {
+    complain(made.error().message);
+    return Outcome::Failed;
+  }
+  const Descriptor lock(
+      open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NOCTTY, 0600));
+  if (!lock) {
+    complain(systemError("open", path).message);
+    return Outcome::Failed;
+  }
+  if (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
+    if (errno == EWOULDBLOCK) return Outcome::Done;
+    complain(systemError("lock", path).message);
+    return Outcome::Failed;
+  }
+  return runLocked(atOnce);
+}
+
+Outcome Uploader::runLocked(bool atOnce) {
+  const Permission permitted = permission();
+  if (permitted == Permission::Withdrawn) return removeWaiting();
+  if (permitted == Permission::NotGiven) return Outcome::Done;
+  services_.submission.submitDiagnosticLogs();
+  auto logs = outbox_.logs();
+  if (!logs) {
+    complain(logs.error().message);
+    return Outcome::Failed;
+  }
+  if (logs->empty()) return Outcome::Done;
+
+  state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
+  const plist::Date now = services_.clock.now();
+  if (!atOnce && mustWait(state_, now)) {
+    services_.log.log(LogLevel::Debug, "the next attempt is not before %s",
+                      isoDateText(*state_.nextAttempt));
+    return Outcome::Waits;
+  }
+  if (const std::string reason = reasonToWait(services_.root, services_.files, configuration_);
+      !reason.empty()) {
+    services_.log.log(LogLevel::Info, "logs wait: %s", reason);
+    return Outcome::Waits;
+  }
+
+  connection_.emplace(configuration_);
+  const Outcome outcome = sendAll(*std::move(logs));
+  if (sent_ + refused_ > 0) {
+    services_.log.log(LogLevel::Default, "logs sent: %llu, refused by the server: %llu",
+                      std::uint64_t{sent_}, std::uint64_t{refused_});
+  }
+  if (tried_) {
+    state_.lastAttempt = now;
+    if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
+        !written) {
+      complain(written.error().message);
+    }
+  }
+  return hasComplained_ ? Outcome::Failed : outcome;
+}
+
+Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
+  while (!logs.empty()) {
+    const std::size_t before = sent_ + refused_;
+    for (const WaitingLog& log : logs) {
+      if (timeLeft() <= std::chrono::milliseconds(0)) {
+        services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
+                          std::int64_t{configuration_.run.count()});
+        return Outcome::Waits;
+      }
+      switch (send(log)) {
+        case Step::Next:
+          break;
+        case Step::Stop:
+          return Outcome::Waits;
+        case Step::Withdrawn:
+          return removeWaiting();
+      }
+    }
+    // What came meanwhile, and what was changed. A pass that sends nothing is the last.
+    if (sent_ + refused_ == before) break;
+    auto more = outbox_.logs();
+    if (!more) {
+      complain(more.error().message);
+      return Outcome::Failed;
+    }
+    logs = *std::move(more);
+  }
+  return Outcome::Done;
+}
+
+Uploader::Step Uploader::send(const WaitingLog& log) {
+  if (!isPlain(log.name)) {
+    complain(format("cannot send %s: its name is none that the system gives; remove it",
+                    percentEncoded(outbox_.logPath(log.name))));
+    return Step::Next;
+  }
+  const auto packed = packer_.pack(outbox_.logPath(log.name));
+  if (!packed) {
+    complain(packed.error().message);
+    return Step::Next;
+  }
+  if (!*packed) return Step::Next;
+  FileSubmission::FiledLog filed{FileSubmission::Place::Outbox, log.name, {}, {}};
+  services_.submission.readMetadata(filed);
+  std::vector<std::string> headers = metadataHeaders(filed.metadata);
+  headers.push_back(std::string(kDigestHeader) + ": " + (*packed)->digest);
+
+  if (const Step asked = askPermission(); asked != Step::Next) return asked;
+  tried_ = true;
+  const auto answer =
+      connection_->put(configuration_.url + "/" + log.name + ".log", headers, (*packed)->content,
+                       std::min<std::chrono::milliseconds>(configuration_.transfer, timeLeft()),
+                       [this] { return permission() == Permission::Given; });
+  if (answer) return judge(log, *answer, **packed);
+  if (const Step asked = askPermission(); asked != Step::Next) return asked;
+  return fail(log, answer.error().message);
+}
+
+Uploader::Step Uploader::askPermission() {
+  switch (permission()) {
+    case Permission::Given:
+      return Step::Next;
+    case Permission::Withdrawn:
+      return Step::Withdrawn;
+    case Permission::NotGiven:
+      break;
+  }
+  return Step::Stop;
+}
+
+Uploader::Step Uploader::judge(const WaitingLog& log, const Answer& answer,
+                               const PackedLog& packed) {
+  const long status = answer.status;
+  if (status == 413 || status == 422) return giveUp(log, status);
+  const bool isTaken = status == 200 || status == 201 || status == 204;
+  if (isTaken && answer.received == packed.digest) return confirm(log, packed);
+
+  std::string why = format("the server answers %ld", status);
+  if (isTaken) {
+    why += format(
+        " without %s and the log's digest: is this the log server, or a portal of the "
+        "network?",
+        kReceivedHeader);
+  } else if (!answer.location.empty()) {
+    why += format(" and points to %s: redirects are not followed; mend URL",
+                  percentEncoded(answer.location.substr(0, 200)));
+  } else if (status == 401 || status == 403) {
+    why += ": check the certificate or the token";
+  } else if (status == 404) {
+    why += ": check URL";
+  }
+  return fail(log, why, answer.retryAfter);
+}
+
+Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed) {
+  const auto stamp = stampOf(outbox_.logPath(log.name));
+  if (stamp && *stamp != packed.stamp) {
+    complain(format("log %s was changed while it was sent: it is sent again", log.name));
+    return Step::Next;
+  }
+  if (Status removed = outbox_.remove(log.name); !removed) {
+    complain(removed.error().message);
+    return fail(log, removed.error().message);
+  }
+  ++sent_;
+  ++state_.sent;
+  state_.lastSuccess = services_.clock.now();
+  state_.nextAttempt.reset();
+  state_.failure.clear();
+  state_.failedAttempts = 0;
+  return Step::Next;
+}
+
+Uploader::Step Uploader::giveUp(const WaitingLog& log, long status) {
+  services_.log.log(LogLevel::Error, "the server refuses log %s (%ld): it is kept in %s/refused",
+                    log.name, status, outbox_.folder());
+  if (Status moved = outbox_.refuse(log.name); !moved) {
+    complain(moved.error().message);
+    return fail(log, moved.error().message);
+  }
+  ++refused_;
+  ++state_.refused;
+  state_.nextAttempt.reset();
+  state_.failure.clear();
+  state_.failedAttempts = 0;
+  return Step::Next;
+}
+
+Uploader::Step Uploader::fail(const WaitingLog& log, std::string_view why,
+                              std::int64_t serverWish) {
+  const plist::Date now = services_.clock.now();
+  ++state_.failedAttempts;
+  state_.lastFailure = now;
+  state_.nextAttempt = plist::Date::sinceEpoch(
+      now.secondsSinceEpoch() + pauseSeconds(state_.failedAttempts, serverWish, chance()));
+  state_.failure = format("cannot send log %s: %s", log.name, why);
+  services_.log.log(LogLevel::Error, "%s; next attempt after %s", state_.failure,
+                    isoDateText(*state_.nextAttempt));
+  return Step::Stop;
+}
+
+Outcome Uploader::removeWaiting() {
+  const auto removed = outbox_.removeAll();
+  if (!removed) {
+    complain(removed.error().message);
+    return Outcome::Failed;
+  }
+  if (*removed > 0) {
+    services_.log.log(LogLevel::Default,
+                      "the permission to send logs is withdrawn: %llu that waited are removed",
+                      std::uint64_t{*removed});
+  }
+  return Outcome::Done;
+}
+
+}  // namespace tavrel::upload

@@ -1,0 +1,87 @@
+// One run of the uploader: sends the logs of the outbox, one at a time, oldest first.
+//
+// A log is removed only once the server has confirmed it, and given up only when the server says
+// that it is the log's own fault (413, 422). Whatever else happens, it stays; at worst the server
+// gets it once more under the same name.
+#pragma once
+
+#include <chrono>
+#include <cstddef>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "platform/clock.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/preferences.h"
+#include "platform/property_list_coding.h"
+#include "platform/system_log.h"
+#include "upload/configuration.h"
+#include "upload/connection.h"
+#include "upload/outbox.h"
+#include "upload/packed_log.h"
+#include "upload/state.h"
+
+namespace tavrel::upload {
+
+/// What an uploader needs of the system; all of it outlives the uploader.
+struct Services {
+  const DeviceRoot& root;
+  FileSystem& files;
+  PropertyListCoding& propertyLists;
+  Preferences& preferences;
+  FileSubmission& submission;
+  Clock& clock;
+  SystemLog& log;
+};
+
+enum class Outcome {
+  Done,    // nothing is left to do
+  Waits,   // logs wait for a later run
+  Failed,  // something on the device is not in order
+};
+
+class Uploader {
+ public:
+  Uploader(const Services& services, const Configuration& configuration);
+
+  /// With `atOnce` an earlier failure does not make it wait. Ends quietly while another run is on.
+  Outcome run(bool atOnce);
+
+ private:
+  enum class Permission { Given, Withdrawn, NotGiven };
+  enum class Step { Next, Stop, Withdrawn };
+
+  Permission permission();
+  Outcome runLocked(bool atOnce);
+  Outcome sendAll(std::vector<WaitingLog> logs);
+  Step send(const WaitingLog& log);
+  /// Whether a log may be sent now; `Next` when it may.
+  Step askPermission();
+  Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
+  Step confirm(const WaitingLog& log, const PackedLog& packed);
+  Step giveUp(const WaitingLog& log, long status);
+  Step fail(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
+  /// Something on the device itself is in the way.
+  void complain(std::string_view line);
+  Outcome removeWaiting();
+  std::chrono::milliseconds timeLeft() const;
+
+  const Services services_;
+  const Configuration& configuration_;
+  Outbox outbox_;
+  LogPacker packer_;
+  std::optional<Connection> connection_;  // made when there is something to send
+  const std::string statePath_;
+  const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
+  State state_;
+  std::size_t sent_ = 0;
+  std::size_t refused_ = 0;
+  bool tried_ = false;
+  bool hasComplained_ = false;
+};
+
+}  // namespace tavrel::upload
