@@ -27,6 +27,7 @@ LIMITS = {
     "service: delivery to log, wall ms": 50.0,
     "live sample: CPU of one value, us": 6.0,
     "live sample: memory, MiB": 12.0,
+    "upload: wall time, ratio to curl": 2.0,
 }
 
 
