@@ -118,16 +118,21 @@ def fill(device, logs):
     return outbox
 
 
-def timed(command, environment):
+def timed(command, device, environment):
     """Wall and CPU seconds, and the peak of memory in MiB."""
+    peak = device.path("peak")
     started = time.monotonic()
-    process = subprocess.Popen(command, env=environment, stdout=subprocess.DEVNULL,
+    # The peak that wait4 knows begins with this process's own.
+    process = subprocess.Popen(["/usr/bin/time", "-f", "%M", "-o", peak, *command],
+                               env=environment, stdout=subprocess.DEVNULL,
                                stderr=subprocess.DEVNULL)
     _, status, usage = os.wait4(process.pid, 0)
+    wall = time.monotonic() - started
     process.returncode = os.waitstatus_to_exitcode(status)
     if process.returncode != 0:
         raise SystemExit(f"{command[0]} ended with {process.returncode}")
-    return time.monotonic() - started, usage.ru_utime + usage.ru_stime, usage.ru_maxrss / 1024
+    with open(peak, encoding="ascii") as file:
+        return wall, usage.ru_utime + usage.ru_stime, int(file.read()) / 1024
 
 
 def main():
@@ -154,10 +159,10 @@ def main():
         curls.append(timed(["curl", "--fail", "--silent", "--http1.1", "--cacert",
                             server.path("ca.crt"), "--cert", server.path("device.crt"), "--key",
                             server.path("device.key"), "--config", device.path("curl.conf")],
-                           device.environment))
+                           device, device.environment))
         if server.take_logs() != logs:
             raise SystemExit("curl has not sent each log")
-        uploads.append(timed([os.path.join(device.bin, "tavrel-upload")], environment))
+        uploads.append(timed([os.path.join(device.bin, "tavrel-upload")], device, environment))
         if {name: gzip.decompress(log) for name, log in server.take_logs().items()} != logs:
             raise SystemExit("tavrel-upload has not sent each log")
         if os.listdir(outbox):

@@ -4,8 +4,6 @@
 
 #include <arpa/inet.h>
 #include <atomic>
-#include <functional>
-#include <netinet/in.h>
 #include <poll.h>
 #include <signal.h>
 #include <sys/socket.h>
@@ -19,13 +17,10 @@ namespace tavrel {
 /// A socket that listens at a free port of 127.0.0.1.
 inline Descriptor listenAtFreePort(int& port) {
   Descriptor listener(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
-  sockaddr_in address{};
-  address.sin_family = AF_INET;
-  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  sockaddr_in address{AF_INET, 0, {htonl(INADDR_LOOPBACK)}, {}};
   socklen_t size = sizeof address;
   auto* const plain = reinterpret_cast<sockaddr*>(&address);
-  EXPECT_EQ(bind(listener.get(), plain, size), 0);
-  EXPECT_EQ(listen(listener.get(), 16), 0);
+  EXPECT_EQ(bind(listener.get(), plain, size) + listen(listener.get(), 16), 0);
   getsockname(listener.get(), plain, &size);
   port = ntohs(address.sin_port);
   return listener;
@@ -36,24 +31,9 @@ inline void replaceAll(std::string& text, std::string_view from, std::string_vie
     text.replace(at, from.size(), to);
 }
 
-inline void shell(const std::string& command) {
-  ASSERT_EQ(std::system((command + " 2>&1").c_str()), 0) << command;  // NOLINT(cert-env33-c)
-}
-
 class Nginx {
  public:
   Nginx() {
-    // Self-signed: another authority; signed: the server for 127.0.0.1, and a device.
-    const std::string request = "cd '" + folder +
-                                "' && openssl req -x509 -days 2 -nodes -newkey ec "
-                                "-pkeyopt ec_paramgen_curve:P-256 -out $N.crt -keyout $N.key ";
-    shell("N=ca; " + request + "-subj /CN=ca; N=other; " + request + "-subj /CN=ca; N=server; " +
-          request +
-          "-subj /CN=s -CA ca.crt -CAkey ca.key -addext subjectAltName=IP:127.0.0.1; "
-          "N=device; " +
-          request +
-          "-subj '/O=Example/CN=device-7' -CA ca.crt -CAkey ca.key; "
-          "cp ca.crt devices-authority.crt; mkdir srv");
     listenAtFreePort(port);
     std::string site = contentOf(TAVREL_EXAMPLES "/upload/nginx.conf");
     replaceAll(site, "listen 443", "listen 127.0.0.1:" + std::to_string(port));
@@ -61,43 +41,46 @@ class Nginx {
     replaceAll(site, "/srv/tavrel", folder + "/srv");
     replaceAll(site, "/var/log/nginx", folder);
     std::string main = geteuid() == 0 ? "user root;" : "";
-    main += "daemon off; pid nginx.pid; events {} http {\n";
-    for (const char* name : {"client_body", "proxy", "fastcgi", "uwsgi", "scgi"})
-      main += std::string(name) + "_temp_path tmp-" + name + ";\n";
-    root.write("/nginx.conf", main + "access_log off;\n" + site + "}");
+    main += "daemon off; pid nginx.pid; events {} http { access_log off;";
+    for (const std::string name : {"client_body", "proxy", "fastcgi", "uwsgi", "scgi"})
+      main += name + "_temp_path tmp-" + name + ";";
+    root.write("/nginx.conf", main + site + "}");
     process = fork();
     if (process == 0) {
-      execlp("nginx", "nginx", "-p", folder.c_str(), "-c", "nginx.conf", "-e", "error.log",
-             nullptr);
+      execlp("sh", "sh", "-c", kStart, folder.c_str(), nullptr);
       _exit(127);
     }
-    sockaddr_in address{};
-    address.sin_family = AF_INET;
-    address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-    address.sin_port = htons(static_cast<std::uint16_t>(port));
-    while (waitpid(process, nullptr, WNOHANG) == 0) {
-      const Descriptor client(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
-      if (connect(client.get(), reinterpret_cast<sockaddr*>(&address), sizeof address) == 0) return;
+    // It listens before it writes this file.
+    while (!std::filesystem::exists(folder + "nginx.pid")) {
+      if (waitpid(process, nullptr, WNOHANG) != 0)
+        throw std::runtime_error("nginx has ended: " + contentOf(folder + "error.log"));
       usleep(2000);
     }
-    ADD_FAILURE() << "nginx has ended: " << contentOf(folder + "/error.log");
   }
   ~Nginx() { end(); }
   /// Once it has ended, which completes its log.
-  Lines accessLog() {
+  std::string accessLog() {
     end();
-    Lines lines;
-    std::ifstream file(folder + "/tavrel-upload.log");
-    for (std::string line; std::getline(file, line);)
-      lines.push_back(line);
-    return lines;
+    return contentOf(folder + "tavrel-upload.log");
   }
 
   const TemporaryRoot root;
-  const std::string folder = root.root.path("");
+  const std::string folder = root.root.path("/");
   int port = 0;
 
  private:
+  // Certificates of two authorities, the server for 127.0.0.1, and a device; then nginx.
+  static constexpr const char* kStart = R"(cd "$0" && mkdir srv
+    make() {
+      N=$1; shift
+      openssl req -x509 -days 2 -nodes -newkey ec -pkeyopt ec_paramgen_curve:P-256 \
+        -out "$N.crt" -keyout "$N.key" "$@" 2>>openssl.log
+    }
+    signed="-CA ca.crt -CAkey ca.key"
+    make ca -subj /CN=ca && cp ca.crt devices-authority.crt && make other -subj /CN=ca &&
+      make server -subj /CN=s $signed -addext subjectAltName=IP:127.0.0.1 &&
+      make device -subj /O=Example/CN=device-7 $signed &&
+      exec nginx -p "$0" -c nginx.conf -e error.log)";
   void end() {
     if (process == 0) return;
     kill(process, SIGQUIT);
@@ -106,14 +89,12 @@ class Nginx {
   pid_t process = 0;
 };
 
-/// Takes each request whole and answers with the text that `answer` gives, in which "DIGEST" stands
-/// for the request's own. An empty one closes the connection.
+/// Takes each request whole and answers with the text that the reply gives, in which "DIGEST"
+/// stands for the request's own. An empty one closes the connection.
 class ScriptedServer {
  public:
   using Reply = std::function<std::string(const std::string& request)>;
-  explicit ScriptedServer(Reply reply) : reply_(std::move(reply)) {
-    thread_ = std::thread([this] { serve(); });
-  }
+  explicit ScriptedServer(Reply reply) : reply_(std::move(reply)), thread_([this] { serve(); }) {}
   ~ScriptedServer() {
     isOver_ = true;
     thread_.join();
@@ -122,6 +103,14 @@ class ScriptedServer {
 
   std::atomic<int> connections = 0;
   std::atomic<bool> closesAfterAnswer = false;
+  std::atomic<bool> readsWhole = true;
+
+  static std::string valueOf(const std::string& request, const std::string& header) {
+    const std::size_t at = request.find(header + ": ");
+    if (at == request.npos) return {};
+    const std::size_t begin = at + header.size() + 2;
+    return request.substr(begin, request.find('\r', at) - begin);
+  }
 
  private:
   bool isReadable(int descriptor) const {
@@ -138,28 +127,21 @@ class ScriptedServer {
       }
     }
   }
-  static std::string valueOf(const std::string& request, const std::string& header) {
-    const std::size_t at = request.find(header + ": ");
-    if (at == request.npos) return {};
-    return request.substr(at + header.size() + 2, request.find('\r', at) - at - header.size() - 2);
-  }
   bool answerOne(int client) {
     std::string request;
-    std::size_t wanted = std::string::npos;
-    while (request.size() < wanted) {
+    for (std::size_t wanted = std::string::npos; request.size() < wanted;) {
       char piece[65536];
-      if (!isReadable(client)) return false;
-      const ssize_t size = read(client, piece, sizeof piece);
+      const ssize_t size = isReadable(client) ? read(client, piece, sizeof piece) : 0;
       if (size <= 0) return false;
       request.append(piece, static_cast<std::size_t>(size));
       const std::size_t head = request.find("\r\n\r\n");
-      if (head != request.npos)
-        wanted = head + 4 + std::stoul("0" + valueOf(request, "Content-Length"));
+      if (head == request.npos) continue;
+      wanted = readsWhole ? head + 4 + std::stoul("0" + valueOf(request, "Content-Length")) : 0;
     }
     std::string answer = reply_(request);
     replaceAll(answer, "DIGEST", valueOf(request, "Content-Digest"));
-    if (answer.empty()) return false;
-    return send(client, answer.data(), answer.size(), MSG_NOSIGNAL) > 0 && !closesAfterAnswer;
+    return !answer.empty() && send(client, answer.data(), answer.size(), MSG_NOSIGNAL) > 0 &&
+           !closesAfterAnswer;
   }
 
   Reply reply_;
