@@ -65,9 +65,13 @@ Connection::Connection(const Configuration& configuration)
   set(handle, CURLOPT_FOLLOWLOCATION, 0L);
   set(handle, CURLOPT_PROXY, "");
   set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
-  setText(handle, CURLOPT_CAINFO, configuration.authority);
+  if (!configuration.authority.empty()) {
+    set(handle, CURLOPT_CAINFO, configuration.authority.c_str());
+    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // not the system's as well
+  }
   setText(handle, CURLOPT_SSLCERT, configuration.certificate);
   setText(handle, CURLOPT_SSLKEY, configuration.key);
+  set(handle, CURLOPT_KEYPASSWD, "");  // instead of asking on a terminal
   set(handle, CURLOPT_CONNECTTIMEOUT, static_cast<long>(configuration.connect.count()));
   set(handle, CURLOPT_LOW_SPEED_LIMIT, kSlowest);
   set(handle, CURLOPT_LOW_SPEED_TIME, static_cast<long>(configuration.stall.count()));

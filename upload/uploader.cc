@@ -103,7 +103,7 @@ Outcome Uploader::runLocked(bool atOnce) {
   state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const plist::Date now = services_.clock.now();
   if (!atOnce && mustWait(state_, now)) {
-    services_.log.log(LogLevel::Debug, "the next attempt is not before %s",
+    services_.log.log(LogLevel::Info, "logs wait: the next attempt is not before %s",
                       isoDateText(*state_.nextAttempt));
     return Outcome::Waits;
   }

@@ -1,0 +1,77 @@
+// A device whose logs are sent, beside the servers that they are sent to.
+#pragma once
+
+#include "servers.h"
+#include "tests/platform/device_services.h"
+#include "upload/uploader.h"
+
+namespace tavrel {
+
+namespace fs = std::filesystem;
+using upload::Outcome;
+
+inline const std::string kSubmission = "/var/mobile/Library/Logs/Submission/";
+inline const std::string kOutbox = kSubmission + "outbox/";
+
+inline std::string status(const std::string& line, const std::string& headers = {}) {
+  return "HTTP/1.1 " + line + "\r\n" + headers + "Content-Length: 0\r\n\r\n";
+}
+inline const std::string kOk = status("201 Created", "Tavrel-Received: DIGEST\r\n");
+
+inline std::string nameOf(int number) {
+  return format("log-tallied-20261127T18%02d%02dZ-5f0c9a1e", number / 60, number % 60);
+}
+
+struct Device : DeviceServices {
+  Device() { permit("<true/>"); }
+
+  void permit(const std::string& value) const {
+    write("/var/mobile/Library/Preferences/com.norvane.zentrix.plist",
+          "<plist version=\"1.0\"><dict><key>DiagnosticSubmissionEnabled</key>" + value +
+              "</dict></plist>");
+  }
+  void configure(const std::string& settings) const {
+    write(upload::kConfigurationPath,
+          "<plist version=\"1.0\"><dict>" + settings + "</dict></plist>");
+  }
+  void add(const std::string& name, const std::string& place = "outbox/",
+           std::string_view version = "Pellio 4.2 (16R349)") {
+    const plist::Dictionary metadata{{"LogType", "193"},
+                                     {"LogName", "log-tallied"},
+                                     {"OSVersion", version},
+                                     {"Time", clock.time},
+                                     {"Options", plist::Dictionary{{"a&b", "x y"}, {"c", 7}}}};
+    write(kSubmission + place + name + ".metadata.plist", *coding.encodeXml(metadata));
+    write(kSubmission + place + name + ".log", "content of " + name);
+  }
+  Lines names(const std::string& place = "outbox") {
+    return *files.list(root.path(kSubmission + place));
+  }
+  upload::State state() {
+    return upload::readState(files, coding, log, root.path(upload::kStatePath));
+  }
+  Outcome run(bool atOnce = false) {
+    LinuxSystemVersion version(root, files, coding, log);
+    FileSubmission submission(root, files, coding, preferences, version, clock, log);
+    return upload::Uploader({root, files, coding, preferences, submission, clock, log},
+                            configuration)
+        .run(atOnce);
+  }
+  Outcome runAgainst(const ScriptedServer& server, bool atOnce = false) {
+    configuration.url = server.url();
+    configuration.host = "127.0.0.1";
+    configuration.mayBePlain = true;
+    return run(atOnce);
+  }
+  void use(const std::string& url, const std::string& folder, const std::string& authority,
+           const std::string& certificate) {
+    configuration.url = url;
+    configuration.host = "127.0.0.1";
+    configuration.authority = folder + authority + ".crt";
+    configuration.certificate = certificate.empty() ? "" : folder + certificate + ".crt";
+    configuration.key = certificate.empty() ? "" : folder + certificate + ".key";
+  }
+  upload::Configuration configuration;
+};
+
+}  // namespace tavrel

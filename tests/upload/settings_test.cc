@@ -1,0 +1,174 @@
+#include <dlfcn.h>
+#include <netdb.h>
+
+#include "device.h"
+#include "upload/network.h"
+
+// Stands in for the C library's: the look-up of one name never ends.
+extern "C" int getaddrinfo(const char* node, const char* service, const addrinfo* hints,
+                           addrinfo** result) {
+  if (node != nullptr && std::string_view(node) == "hangs.example") pause();
+  using Original = decltype(&getaddrinfo);
+  static const auto kOriginal = reinterpret_cast<Original>(dlsym(RTLD_NEXT, "getaddrinfo"));
+  return kOriginal(node, service, hints, result);
+}
+
+namespace tavrel {
+namespace {
+
+TEST(Upload, HasADeadlineForEverything) {
+  using std::chrono::seconds;
+  Device device;
+  device.add(nameOf(1));
+  device.configuration.stall = seconds(1);
+  ScriptedServer silent([](const std::string&) { return "H"; });
+  EXPECT_EQ(device.runAgainst(silent), Outcome::Waits);
+  EXPECT_TRUE(
+      device.log.says("Operation too slow. Less than 100 bytes/sec transferred the last 1 "));
+  device.configuration.stall = seconds(60);
+  for (auto* const limit : {&device.configuration.transfer, &device.configuration.run}) {
+    *limit = seconds(1);
+    device.log.lines.clear();
+    EXPECT_EQ(device.run(true), Outcome::Waits);
+    EXPECT_TRUE(device.log.says("Operation timed out after 1"));
+    *limit = seconds(600);
+  }
+  device.configuration.url = "http://hangs.example/logs";
+  device.configuration.connect = seconds(1);
+  // In a process of its own: the look-up never ends.
+  EXPECT_EQ(inChild([&] {
+              return device.run(true) == Outcome::Waits &&
+                             device.log.says("Resolving timed out after 1")
+                         ? 0
+                         : 1;
+            }),
+            0);
+  EXPECT_EQ(device.names().size(), 2U);
+}
+
+TEST(Upload, WaitsForANetworkThatMayBeUsed) {
+  const auto row = [](const char* name, const char* to, const char* flags, int metric) {
+    return format("%s\t%s\t0100A8C0\t%s\t0\t0\t%d\t00000000\t0\t0\t0\n", name, to, flags, metric);
+  };
+  const std::string zero(32, '0');
+  const auto row6 = [&](const std::string& rest) {
+    return zero + " 00 " + zero + " 00 " + zero + " " + rest + "\n";
+  };
+  const std::string head =
+      "Iface\tDestination\tGateway\tFlags\tRefCnt\tUse\tMetric\tMask\tM\tW\tI\n";
+  const std::string lan = row("eth0", "0000A8C0", "0001", 0);
+  const std::string eth = row("eth0", "00000000", "0003", 100);
+  const std::string down = row("wwan0", "00000000", "0002", 1);
+  const std::string rejected = row6("ffffffff 00000001 00000000 00200200 lo");
+  const std::tuple<std::string, std::string, std::string> cases[] = {
+      {head + lan + down, rejected, "there is no default route"},
+      {head + lan + down + eth, rejected, ""},
+      {head + eth + row("wwan0", "00000000", "0003", 50), "", "the network is metered (wwan0)"},
+      {head, row6("00000400 1 0 00000003 wwan1"), "the network is metered (wwan1)"},
+      {"garbage\n\n" + eth.substr(0, 20), "x", "there is no default route"}};
+  Device device;
+  device.add(nameOf(1));
+  device.configuration.meteredInterfaces = {"ppp0", "wwan*"};
+  const auto reason = [&](const char* host) {
+    device.configuration.host = host;
+    return upload::reasonToWait(device.root, device.files, device.configuration);
+  };
+  for (const auto& [four, six, expected] : cases) {
+    device.write("/proc/net/route", four);
+    device.write("/proc/net/ipv6_route", six);
+    EXPECT_EQ(reason("logs.example.com"), expected);
+    for (const char* host : {"127.0.0.1", "localhost", "::1"})
+      EXPECT_EQ(reason(host), "") << host;
+  }
+  device.configuration.host = "127.evil.example";
+  EXPECT_EQ(device.run(), Outcome::Waits);
+  EXPECT_EQ(device.log.lines, Lines{"logs wait: there is no default route"});
+  EXPECT_FALSE(fs::exists(device.root.path(upload::kStatePath)));
+}
+
+TEST(Upload, PausesLongerFromFailureToFailure) {
+  const std::tuple<std::int64_t, std::int64_t, double, double> cases[] = {
+      {1, 0, 0, 300},     {1, 0, 1, 600},     {2, 0, 1, 1200},
+      {8, 0, 0, 38400},   {9, 0, 1, 86400},   {INT64_MAX, 0, 1, 86400},
+      {1, 1000, 0, 1000}, {1, 1000, 1, 1100}, {1, 86400, 1, 86400}};
+  for (const auto& [failures, wish, chance, pause] : cases)
+    EXPECT_EQ(upload::pauseSeconds(failures, wish, chance), pause) << failures << ' ' << wish;
+}
+
+TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
+  Device device;
+  const std::string at = device.root.path(upload::kConfigurationPath);
+  const auto configured = [&](const std::string& settings) {
+    device.configure(settings);
+    return upload::readConfiguration(device.root, device.files, device.coding,
+                                     device.root.path("/credentials"));
+  };
+  const std::string url = "<key>URL</key><string>";
+  const std::string noUrl = "URL is not an address: give https://HOST/FOLDER";
+  const std::string more =
+      "URL has more than a host and a path: leave out user, query and fragment";
+  const std::string noTime = " is not a time: give an integer from 1 to 86400 seconds";
+  const std::pair<std::string, std::string> cases[] = {
+      {"", "URL is missing: give https://HOST/FOLDER"},
+      {url + "http://a</string>",
+       "URL begins with http: use https, or set AllowPlainHTTP in a laboratory"},
+      {url + "ftp://a/b</string>", noUrl},
+      {url + "https://a /b</string>", noUrl},
+      {url + "https://u@a/b</string>", more},
+      {url + "https://a/b?c</string>", more},
+      {"<key>Url</key><string/>", "Url is not a setting: see tavrel-upload(8)"},
+      {"<key>StallSeconds</key><integer>0</integer>", "StallSeconds" + noTime},
+      {"<key>RunSeconds</key><real>5</real>", "RunSeconds" + noTime},
+      {"<key>AllowPlainHTTP</key><integer>1</integer>",
+       "AllowPlainHTTP is not a boolean: give true or false"},
+      {"<key>MeteredInterfaces</key><array><true/></array>",
+       "MeteredInterfaces is not an array of names: give strings like wwan*"}};
+  for (const auto& [settings, why] : cases)
+    EXPECT_EQ(configured(settings).error().message, "cannot use " + at + ": " + why) << settings;
+  const std::string good = url + "https://[::1]:8443/a/</string>";
+  EXPECT_EQ(configured(good)->host, "::1");
+  EXPECT_EQ(configured(good)->url, "https://[::1]:8443/a");
+  device.write("/credentials/tavrel-upload.token", "two words\n");
+  EXPECT_EQ(configured(good).error().message,
+            "cannot use the credential tavrel-upload.token: a token has letters, digits and "
+            "-._~+/= on one line");
+  device.write("/credentials/tavrel-upload.token", "Abc-1==\n");
+  device.configuration.token = configured(good)->token;
+  device.write("/credentials/tavrel-upload.key", "k");
+  EXPECT_EQ(configured(good).error().message,
+            "cannot use the client certificate: the credential tavrel-upload.certificate is "
+            "missing: give both");
+  std::string authorization;
+  ScriptedServer server([&](const std::string& request) {
+    authorization = ScriptedServer::valueOf(request, "Authorization");
+    return kOk;
+  });
+  device.add(nameOf(1));
+  EXPECT_EQ(device.runAgainst(server), Outcome::Done);
+  EXPECT_EQ(authorization, "Bearer Abc-1==");
+}
+
+TEST(Upload, TellsTheServiceManagerHowItEnded) {
+  Device device;
+  device.configure(
+      "<key>URL</key><string>http://127.0.0.1:1/</string><key>AllowPlainHTTP</key><true/>");
+  const auto run = [&](const std::string& arguments, const std::string& below = "/") {
+    const std::string command = "TAVREL_ROOT=" + device.root.path(below) + " " TAVREL_UPLOAD " " +
+                                arguments + " >/dev/null 2>&1";
+    return WEXITSTATUS(std::system(command.c_str()));  // NOLINT(cert-env33-c)
+  };
+  EXPECT_EQ(run(""), 0) << "nothing to do";
+  device.add(nameOf(1), "pending/");
+  for (const char* arguments : {"", "--now", ""})
+    EXPECT_EQ(run(arguments), 75);
+  EXPECT_EQ(device.state().failedAttempts, 2);
+  for (const char* arguments : {"--then", "then"})
+    EXPECT_EQ(run(arguments), 2);
+  EXPECT_EQ(run("--version"), 0);
+  EXPECT_EQ(run("", "/missing"), 1);
+  device.configure("");
+  EXPECT_EQ(run(""), 78);
+}
+
+}  // namespace
+}  // namespace tavrel
