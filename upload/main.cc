@@ -38,8 +38,6 @@ int upload(SystemLog& log, bool atOnce) {
   plist::PlistCoding propertyLists;
   LinuxClock clock;
   FilePreferences preferences(root, files, propertyLists, clock, log);
-  LinuxSystemVersion systemVersion(root, files, propertyLists, log);
-  FileSubmission submission(root, files, propertyLists, preferences, systemVersion, clock, log);
 
   const char* const credentials = std::getenv("CREDENTIALS_DIRECTORY");
   const auto configuration =
@@ -48,8 +46,7 @@ int upload(SystemLog& log, bool atOnce) {
     log.write(LogLevel::Error, configuration.error().message);
     return kMisconfigured;
   }
-  Uploader uploader({root, files, propertyLists, preferences, submission, clock, log},
-                    *configuration);
+  Uploader uploader({root, files, propertyLists, preferences, clock, log}, *configuration);
   switch (uploader.run(atOnce)) {
     case Outcome::Done:
       return kDone;

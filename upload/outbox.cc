@@ -93,6 +93,9 @@ Status Outbox::remove(std::string_view name) {
 }
 
 Expected<std::size_t> Outbox::removeAll() {
+  if (!FileSystem::status(folder_)) return std::size_t{0};
+  const auto lock = files_.lockFolder(folder_);
+  if (!lock) return lock.error();
   std::size_t count = 0;
   for (const std::string_view place : {kPending, kOutbox}) {
     std::vector<std::string> orphans;
@@ -106,22 +109,39 @@ Expected<std::size_t> Outbox::removeAll() {
   return count;
 }
 
+Status Outbox::move(std::string_view name, std::string_view from, std::string_view to) {
+  const std::string log = path(from, name, kLogEnding);
+  if (!FileSystem::status(log)) return Done{};
+  const std::string metadata = path(from, name, kLogMetadataEnding);
+  const auto content = files_.readIfPresent(metadata, limits::kPropertyListBytes);
+  if (!content) return content.error();
+  const Status ready =
+      *content ? files_.replace(path(to, name, kLogMetadataEnding), asBytes(**content), kMode)
+               : files_.makeFolders(folder_ + "/" + std::string(to));
+  if (!ready) return ready;
+  if (Status moved = files_.rename(log, path(to, name, kLogEnding)); !moved) return moved;
+  files_.discard(metadata);
+  return Done{};
+}
+
+Status Outbox::takePending(const std::function<bool()>& mayMove) {
+  std::vector<std::string> orphans;
+  const auto logs = logsIn(kPending, orphans);
+  if (!logs) return logs.error();
+  Status outcome = Done{};
+  for (const WaitingLog& log : *logs) {
+    const auto lock = files_.lockFolder(folder_);
+    if (!lock) return lock.error();
+    if (!mayMove()) return outcome;
+    if (Status moved = move(log.name, kPending, kOutbox); !moved && outcome) outcome = moved;
+  }
+  return outcome;
+}
+
 Status Outbox::refuse(std::string_view name) {
-  // As whoever else moves or deletes logs.
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return lock.error();
-  const auto metadata = files_.readIfPresent(metadataPath(name), limits::kPropertyListBytes);
-  if (!metadata) return metadata.error();
-  const std::string place = path(kRefused, {}, {});
-  const Status ready = *metadata ? files_.replace(path(kRefused, name, kLogMetadataEnding),
-                                                  asBytes(**metadata), kMode)
-                                 : files_.makeFolders(place.substr(0, place.size() - 1));
-  if (!ready) return ready;
-  if (FileSystem::status(logPath(name))) {
-    const Status moved = files_.rename(logPath(name), path(kRefused, name, kLogEnding));
-    if (!moved) return moved;
-  }
-  files_.discard(metadataPath(name));
+  if (Status moved = move(name, kOutbox, kRefused); !moved) return moved;
   return boundRefused();
 }
 

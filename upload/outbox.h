@@ -5,6 +5,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -32,6 +33,11 @@ class Outbox {
   /// The logs of the outbox, oldest first. Opens no file. Removes metadata whose log is gone.
   Expected<std::vector<WaitingLog>> logs();
 
+  /// Moves what waits in pending/ to the outbox, as long as `mayMove` says so, which is asked for
+  /// each log while nobody else can move it. A log that cannot be moved does not keep others; the
+  /// first failure is told.
+  Status takePending(const std::function<bool()>& mayMove);
+
   /// Removes a log of the outbox. One that is gone already is fine.
   Status remove(std::string_view name);
 
@@ -46,6 +52,8 @@ class Outbox {
   std::string path(std::string_view place, std::string_view name, std::string_view ending) const;
   Expected<std::vector<WaitingLog>> logsIn(std::string_view place,
                                            std::vector<std::string>& orphans);
+  /// The caller has the folder locked.
+  Status move(std::string_view name, std::string_view from, std::string_view to);
   Status removeFrom(std::string_view place, std::string_view name);
   Status boundRefused();
 

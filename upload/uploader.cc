@@ -92,13 +92,16 @@ Outcome Uploader::runLocked(bool atOnce) {
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted == Permission::NotGiven) return Outcome::Done;
-  services_.submission.submitDiagnosticLogs();
+  if (Status taken = outbox_.takePending([this] { return permission() == Permission::Given; });
+      !taken) {
+    complain(taken.error().message);
+  }
   auto logs = outbox_.logs();
   if (!logs) {
     complain(logs.error().message);
     return Outcome::Failed;
   }
-  if (logs->empty()) return Outcome::Done;
+  if (logs->empty()) return hasComplained_ ? Outcome::Failed : Outcome::Done;
 
   state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const plist::Date now = services_.clock.now();
@@ -171,9 +174,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
     return Step::Next;
   }
   if (!*packed) return Step::Next;
-  FileSubmission::FiledLog filed{FileSubmission::Place::Outbox, log.name, {}, {}};
-  services_.submission.readMetadata(filed);
-  std::vector<std::string> headers = metadataHeaders(filed.metadata);
+  std::vector<std::string> headers = metadataHeaders(metadataOf(log));
   headers.push_back(std::string(kDigestHeader) + ": " + (*packed)->digest);
 
   if (const Step asked = askPermission(); asked != Step::Next) return asked;
@@ -185,6 +186,15 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   if (answer) return judge(log, *answer, **packed);
   if (const Step asked = askPermission(); asked != Step::Next) return asked;
   return fail(log, answer.error().message);
+}
+
+// A log without readable metadata is sent without.
+plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
+  const auto bytes =
+      services_.files.readIfPresent(outbox_.metadataPath(log.name), limits::kPropertyListBytes);
+  if (!bytes || !*bytes) return {};
+  const auto value = services_.propertyLists.decode(asBytes(**bytes));
+  return value ? value->dictionary() : plist::Dictionary();
 }
 
 Uploader::Step Uploader::askPermission() {

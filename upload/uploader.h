@@ -15,7 +15,6 @@
 #include "platform/clock.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
-#include "platform/linux/logs/file_submission.h"
 #include "platform/preferences.h"
 #include "platform/property_list_coding.h"
 #include "platform/system_log.h"
@@ -33,7 +32,6 @@ struct Services {
   FileSystem& files;
   PropertyListCoding& propertyLists;
   Preferences& preferences;
-  FileSubmission& submission;
   Clock& clock;
   SystemLog& log;
 };
@@ -59,6 +57,7 @@ class Uploader {
   Outcome runLocked(bool atOnce);
   Outcome sendAll(std::vector<WaitingLog> logs);
   Step send(const WaitingLog& log);
+  plist::Dictionary metadataOf(const WaitingLog& log);
   /// Whether a log may be sent now; `Next` when it may.
   Step askPermission();
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);

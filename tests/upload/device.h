@@ -51,10 +51,7 @@ struct Device : DeviceServices {
     return upload::readState(files, coding, log, root.path(upload::kStatePath));
   }
   Outcome run(bool atOnce = false) {
-    LinuxSystemVersion version(root, files, coding, log);
-    FileSubmission submission(root, files, coding, preferences, version, clock, log);
-    return upload::Uploader({root, files, coding, preferences, submission, clock, log},
-                            configuration)
+    return upload::Uploader({root, files, coding, preferences, clock, log}, configuration)
         .run(atOnce);
   }
   Outcome runAgainst(const ScriptedServer& server, bool atOnce = false) {
