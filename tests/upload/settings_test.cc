@@ -37,6 +37,7 @@ TEST(Upload, HasADeadlineForEverything) {
   device.configuration.connect = seconds(1);
   // In a process of its own: the look-up never ends.
   EXPECT_EQ(inChild([&] {
+              alarm(60);
               return device.run(true) == Outcome::Waits &&
                              device.log.says("Resolving timed out after 1")
                          ? 0
