@@ -100,6 +100,12 @@ class ScriptedServer {
   }
   std::string url() const { return "http://127.0.0.1:" + std::to_string(port_) + "/logs"; }
 
+  /// Waits until the thread waits itself, holding no lock that a forked process would need.
+  void settle() const {
+    while (!isIdle_)
+      sched_yield();
+  }
+
   std::atomic<int> connections = 0;
   std::atomic<bool> closesAfterAnswer = false;
   std::atomic<bool> readsWhole = true;
@@ -114,7 +120,9 @@ class ScriptedServer {
  private:
   void serve() {
     while (true) {
+      isIdle_ = true;
       const Descriptor client(accept4(listener_.get(), nullptr, nullptr, SOCK_CLOEXEC));
+      isIdle_ = false;
       if (!client) return;
       ++connections;
       while (answerOne(client.get())) {
@@ -140,6 +148,7 @@ class ScriptedServer {
 
   Reply reply_;
   int port_ = 0;
+  std::atomic<bool> isIdle_ = false;
   Descriptor listener_ = listenAtFreePort(port_);
   std::thread thread_;
 };

@@ -35,6 +35,7 @@ TEST(Upload, HasADeadlineForEverything) {
   }
   device.configuration.url = "http://hangs.example/logs";
   device.configuration.connect = seconds(1);
+  silent.settle();
   // In a process of its own: the look-up never ends.
   EXPECT_EQ(inChild([&] {
               alarm(60);

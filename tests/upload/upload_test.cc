@@ -233,6 +233,7 @@ TEST(Upload, LosesNothingWhenItIsKilled) {
     device.add(nameOf(2));
     {
       ScriptedServer server(reply);
+      server.settle();
       isKilled = runUntilSystemCall(calls, [&] { device.runAgainst(server); });
     }
     std::set<std::string> kept = arrived;
