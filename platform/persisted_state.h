@@ -32,6 +32,8 @@ inline constexpr std::string_view kTaskingPayloadKey = "TaskingPayload";
 /// identifier, which turn its internal diagnostics on.
 inline constexpr std::string_view kDiagnosticsDomain = "com.norvane.zentrix";
 inline constexpr std::string_view kSubmissionEnabledKey = "DiagnosticSubmissionEnabled";
+/// Integer: the first day, since 1970 UTC, whose statistics may leave. Absent: any day's may.
+inline constexpr std::string_view kSubmissionFirstDayKey = "DiagnosticSubmissionFirstDay";
 
 /// Values that a tasking has set, among them booleans that switch whitelist groups off by name.
 inline constexpr std::string_view kTaskingDomain = "com.norvane.da";

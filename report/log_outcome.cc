@@ -3,7 +3,6 @@
 #include <cstddef>
 #include <iterator>
 
-#include "config/bh_config.h"
 #include "platform/persisted_state.h"
 
 namespace tavrel {
@@ -41,12 +40,6 @@ std::string logOutcomeText(LogOutcome outcome, std::string_view day) {
 
 std::string_view nameOf(LogOutcome outcome) {
   return textsOf(outcome).name;
-}
-
-std::optional<LogOutcome> obstacleToLog(Platform& platform) {
-  if (!platform.submission->isDiagnosticSubmissionEnabled()) return LogOutcome::NotPermitted;
-  if (!platform.files->size(kWhitelistPath)) return LogOutcome::NoWhitelist;
-  return std::nullopt;
 }
 
 std::optional<LogOutcome> lastLogOutcome(Preferences& preferences) {

@@ -25,9 +25,6 @@ std::string logOutcomeText(LogOutcome outcome, std::string_view day);
 /// Its name in preferences and JSON, such as "not-permitted".
 std::string_view nameOf(LogOutcome outcome);
 
-/// What would keep a run from filing a log, as far as is known without making one.
-std::optional<LogOutcome> obstacleToLog(Platform& platform);
-
 /// The outcome of the last gated run, kept in the daemon's own domain; nothing when unknown.
 std::optional<LogOutcome> lastLogOutcome(Preferences& preferences);
 /// Sets the preference if it changes. The caller synchronises the domain.

@@ -38,5 +38,6 @@ int main(int argc, char** argv) {
                                .error = std::cerr,
                                .columns = terminalColumns(),
                                .errorIsTerminal = isatty(STDERR_FILENO) == 1,
+                               .inIsTerminal = isatty(STDIN_FILENO) == 1,
                                .outIsColoured = isColoured()});
 }

@@ -8,6 +8,8 @@
 
 #include "base/format.h"
 #include "base/version.h"
+#include "tools/consent/erase_command.h"
+#include "tools/consent/permission_commands.h"
 #include "tools/device/prefs_commands.h"
 #include "tools/device/send_commands.h"
 #include "tools/device/status_command.h"
@@ -68,14 +70,25 @@ struct Subcommand {
 // In the order of the help. Making them all takes longer than a short command, so a line that names
 // one of them gets only that.
 constexpr Subcommand kSubcommands[] = {
-    {"status", addStatusCommand},      {"rehearse", addRehearseCommand},
-    {"log", addLogCommands},           {"whitelist", addWhitelistCommands},
-    {"stat", addStatCommands},         {"send", addSendCommands},
-    {"notify", addNotifyCommands},     {"tasking", addTaskingCommands},
-    {"disks", addDisksCommand},        {"nand", addNandCommands},
-    {"nandlog", addNandlogCommands},   {"records", addRecordsCommands},
-    {"prefs", addPrefsCommands},       {"plist", addPlistCommands},
-    {"registry", addRegistryCommands}, {"report", addReportCommands},
+    {"status", addStatusCommand},
+    {"allow", addAllowCommand},
+    {"deny", addDenyCommand},
+    {"erase", addEraseCommand},
+    {"rehearse", addRehearseCommand},
+    {"log", addLogCommands},
+    {"whitelist", addWhitelistCommands},
+    {"stat", addStatCommands},
+    {"send", addSendCommands},
+    {"notify", addNotifyCommands},
+    {"tasking", addTaskingCommands},
+    {"disks", addDisksCommand},
+    {"nand", addNandCommands},
+    {"nandlog", addNandlogCommands},
+    {"records", addRecordsCommands},
+    {"prefs", addPrefsCommands},
+    {"plist", addPlistCommands},
+    {"registry", addRegistryCommands},
+    {"report", addReportCommands},
 };
 
 // The first argument that is neither an option nor the folder of --root; empty when there is none.

@@ -18,6 +18,7 @@
 #include "platform/linux/locale/linux_locale.h"
 #include "platform/linux/logs/file_crash_reporting.h"
 #include "platform/linux/logs/file_submission.h"
+#include "platform/linux/logs/guarded_preferences.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/process/linux_clock.h"
 #include "platform/linux/process/linux_event_loop.h"
@@ -54,12 +55,22 @@ struct LinuxPlatform::Services {
   FilePreferences filePreferences{root, fileSystem, propertyLists, clock, log};
   Preferences& preferences =
       options.preferences != nullptr ? *options.preferences : filePreferences;
+  GuardedPreferences guardedPreferences{preferences, log};
   SqliteStore store{
       root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
   SegmentFold fold{root, store, fileSystem, propertyLists, log};
   FoldingStore foldingStore{store, fold, log};
-  FileSubmission submission{root,  fileSystem, propertyLists, preferences, systemVersion,
-                            clock, log};
+  ReportedDays statistics{options.readOnly ? static_cast<StatisticsStore&>(store) : foldingStore};
+  FileSubmission submission{root,
+                            {.files = fileSystem,
+                             .propertyLists = propertyLists,
+                             .preferences = preferences,
+                             .filePreferences = filePreferences,
+                             .reportedDays = statistics,
+                             .systemVersion = systemVersion,
+                             .clock = clock,
+                             .log = log},
+                            options.readOnly};
   EccEvents eccEvents{root, fileSystem, propertyLists, log,
                       options.readOnly ? EccEvents::Mode::Peek : EccEvents::Mode::Consume};
   FileCrashReporting crashReporting{root, fileSystem, systemVersion, eccEvents, clock, log};
@@ -93,12 +104,12 @@ struct LinuxPlatform::Services {
       .log = log,
       .namedServices = namedServices,
       .notifications = notifications,
-      .preferences = preferences,
+      .preferences = guardedPreferences,
       .process = process,
       .propertyLists = propertyLists,
       .stackSnapshots = stackSnapshots,
       .standardStreams = standardStreams,
-      .statistics = options.readOnly ? static_cast<StatisticsStore&>(store) : foldingStore,
+      .statistics = statistics,
       .submission = submission,
       .systemControls = systemControls,
       .systemVersion = systemVersion,

@@ -7,8 +7,11 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
+#include "platform/persisted_state.h"
 #include "platform/plist/xml.h"
+#include "tools/device/known_preferences.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/sorted_entries.h"
@@ -26,6 +29,7 @@ struct Arguments {
   ArgumentKind kind = ArgumentKind::Text;
   bool kindGiven = false;
   bool isDocument = false;
+  bool force = false;
 };
 
 bool checkDomain(ToolContext& context, const std::string& domain) {
@@ -45,9 +49,26 @@ void failAbsent(ToolContext& context, const Arguments& arguments) {
              arguments.key, arguments.domain, arguments.domain));
 }
 
+// A first day belongs to the permission that 'tavrelctl allow' gave: it goes with that. The switch
+// alone then counts at once.
+void forgetFirstDay(ToolContext& context, const plist::Value& value) {
+  Preferences& preferences = context.preferences();
+  const SubmissionPermission former = submissionPermission(preferences);
+  const bool isGiven = value.boolean().value_or(false);
+  if (isGiven == former.isGiven && isGiven) return;
+  preferences.ZTXPreferencesSetValue(kSubmissionFirstDayKey, {}, kDiagnosticsDomain);
+  context.note(isGiven
+                   ? "this counts at once, also for what is recorded already: 'tavrelctl allow' "
+                     "begins with the next day"
+                   : "logs that wait stay until the next run: 'tavrelctl deny' deletes them");
+}
+
 // Stores a value, null to remove the key. When that cannot be done, a note has said why.
 void store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
   Preferences& preferences = context.preferences();
+  if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionEnabledKey) {
+    forgetFirstDay(context, value);
+  }
   preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
   if (!preferences.ZTXPreferencesSynchronize(arguments.domain) ||
       preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain) != value) {
@@ -101,6 +122,8 @@ void set(ToolContext& context, const Arguments& arguments) {
   }
   const auto xml = plist::writeXml(*value);
   if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
+  const std::string fault = faultOfPreference(arguments.domain, arguments.key, *value);
+  if (!fault.empty() && !arguments.force) return context.failUsage(fault);
   noteTextThatReadsOtherwise(context, arguments);
   // As it will be read back: for example, dates lose their fraction.
   store(context, arguments, *plist::readXml(asBytes(*xml)));
@@ -197,6 +220,8 @@ void addPrefsCommands(Command app, ToolContext& context) {
   addKey(setCommand);
   setCommand.addOption("VALUE", arguments->value, "The value").required();
   addKindOptions(setCommand, arguments);
+  setCommand.addFlag("--force", arguments->force,
+                     "Store also what the system would not read as that preference");
 
   const Command deleteCommand = add("delete", "Remove a key", remove);
   addDomain(deleteCommand).required();

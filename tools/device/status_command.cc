@@ -20,7 +20,7 @@ namespace tavrel {
 namespace {
 
 struct DeviceStatus {
-  std::optional<bool> submissionAllowed;  // nothing when preferences cannot be read
+  std::optional<SubmissionPermission> permission;  // nothing when preferences cannot be read
   std::int32_t today = 0;
   bool isStateReadable = true;           // the daemon's own preferences
   std::optional<std::int32_t> lastDay;   // of the gated run
@@ -29,6 +29,7 @@ struct DeviceStatus {
   std::optional<std::int64_t> storeBytes;  // with its write-ahead log; nothing without a store
   Expected<std::optional<SqliteHistory::DaySpan>> days = std::optional<SqliteHistory::DaySpan>();
   Expected<std::size_t> pending = 0;
+  Expected<std::size_t> withheld = 0;
   LogConclusion conclusion;
 };
 
@@ -43,9 +44,8 @@ DeviceStatus takeStatus(ToolContext& context) {
   LinuxPlatform& device = context.linuxPlatform();
   Platform& platform = device.platform();
   DeviceStatus status;
-  const bool isAllowed =
-      context.preferences().ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
-  if (!context.hasComplaints()) status.submissionAllowed = isAllowed;
+  const SubmissionPermission permission = submissionPermission(context.preferences());
+  if (!context.hasComplaints()) status.permission = permission;
   status.today = platform.statistics->BHDaysSince1970();
   bool hasRun = false;
   const auto lastDay =
@@ -67,6 +67,7 @@ DeviceStatus takeStatus(ToolContext& context) {
     }
   }
   status.pending = device.submission().count(FileSubmission::Place::Pending);
+  status.withheld = device.submission().count(FileSubmission::Place::Withheld);
   if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
 }
@@ -87,13 +88,15 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
     store["last_day"] = jsonOfDay((*status.days)->last);
   }
   context.printJson(
-      {{"submission_allowed",
-        status.submissionAllowed ? Json(*status.submissionAllowed) : Json(nullptr)},
+      {{"submission_allowed", status.permission ? Json(status.permission->isGiven) : Json(nullptr)},
+       {"submission_first_day",
+        jsonOfDay(status.permission ? status.permission->firstDay : std::nullopt)},
        {"today", jsonOfDay(status.today)},
        {"last_reported_day", jsonOfDay(status.lastDay)},
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
        {"store", std::move(store)},
        {"pending_logs", status.pending ? Json(*status.pending) : Json(nullptr)},
+       {"withheld_logs", status.withheld ? Json(*status.withheld) : Json(nullptr)},
        {"conclusion", status.isStateReadable ? status.conclusion.json() : Json(nullptr)}});
 }
 
@@ -108,11 +111,9 @@ std::string storeText(const DeviceStatus& status) {
 }
 
 Table::Cell submissionCell(const DeviceStatus& status) {
-  if (!status.submissionAllowed) return {"unknown", Emphasis::Alarm};
-  if (*status.submissionAllowed) return {"allowed"};
-  return {format("not allowed (allow it with: tavrelctl prefs set %s %s true --bool)",
-                 kDiagnosticsDomain, kSubmissionEnabledKey),
-          Emphasis::Alarm};
+  if (!status.permission) return {"unknown", Emphasis::Alarm};
+  if (status.permission->isGiven) return {textOf(*status.permission)};
+  return {"not allowed (allow it with: tavrelctl allow)", Emphasis::Alarm};
 }
 
 void printText(ToolContext& context, const DeviceStatus& status) {
@@ -125,6 +126,11 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   table.add({"Store", storeText(status)});
   table.add({"Store file", status.storePath});
   table.add({"Pending logs", status.pending ? std::to_string(*status.pending) : "unreadable"});
+  if (!status.withheld) {
+    table.add({"Withheld logs", "unreadable: only root may see them"});
+  } else if (*status.withheld > 0) {
+    table.add({"Withheld logs", format("%zu, never sent", *status.withheld)});
+  }
   table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
              status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
   table.print({context.out(), std::nullopt, context.page().isColoured});

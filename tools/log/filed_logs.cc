@@ -36,11 +36,17 @@ bool isRegular(FiledLog& log) {
   return !log.status || S_ISREG(log.status->st_mode);
 }
 
-// The logs of both folders, as their file names describe them.
+// The logs of all folders, as their file names describe them.
 Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
+  using enum FileSubmission::Place;
   std::vector<FiledLog> logs;
-  for (const auto place : {FileSubmission::Place::Outbox, FileSubmission::Place::Pending}) {
+  for (const auto place : {Withheld, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
+    // Other users who look at logs do without those that only root may see.
+    if (!found && place == Withheld) {
+      context.note(found.error().message);
+      continue;
+    }
     if (!found) return found.error();
     for (FileSubmission::FiledLog& log : *found)
       logs.push_back({std::move(log), std::nullopt});
@@ -51,7 +57,8 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
 }  // namespace
 
 std::string_view nameOf(FileSubmission::Place place) {
-  return place == FileSubmission::Place::Pending ? "pending" : "outbox";
+  constexpr std::string_view kNames[] = {"pending", "outbox", "withheld"};
+  return kNames[static_cast<std::size_t>(place)];
 }
 
 std::string fileNameOf(const FiledLog& log) {

@@ -18,13 +18,14 @@ struct FiledLog : FileSubmission::FiledLog {
   std::optional<struct stat> status;  // nothing when unknown
 };
 
-/// "pending" or "outbox".
+/// "pending", "outbox" or "withheld".
 std::string_view nameOf(FileSubmission::Place place);
 
 /// The name of its file, with the ending.
 std::string fileNameOf(const FiledLog& log);
 
-/// The logs of both folders, oldest first.
+/// The logs of all folders, oldest first. A line says so when those that are withheld cannot be
+/// seen.
 Expected<std::vector<FiledLog>> filedLogs(ToolContext& context);
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes. It is chosen by

@@ -144,6 +144,11 @@ void preview(ToolContext& context, const Arguments& arguments) {
   }
   for (const std::string& error : errors)
     context.note(error);
+  const SubmissionPermission permission = submissionPermission(context.preferences());
+  if (permission.isGiven && !permission.covers(day)) {
+    context.note(format("not submitted: this is day %s, and submission is %s", dayText(day),
+                        textOf(permission)));
+  }
   const CapturedLog& log = overlay.logs().back();
   if (!context.json()) {
     context.out() << log.bytes;

@@ -3,6 +3,8 @@
 #include <nlohmann/json.hpp>
 
 #include "base/arithmetic.h"
+#include "base/format.h"
+#include "config/bh_config.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
@@ -12,6 +14,9 @@ namespace tavrel {
 std::string LogConclusion::text() const {
   if (!day) return "none yet";
   if (!outcome) return format("day %s, outcome unknown", dayText(*day));
+  if (isOfNextRun && permission.isGiven && outcome == LogOutcome::NotPermitted) {
+    return format("no log for day %s: submission is %s", dayText(*day), textOf(permission));
+  }
   return logOutcomeText(*outcome, dayText(*day));
 }
 
@@ -28,12 +33,18 @@ LogConclusion concludeOnLogs(ToolContext& context) {
   bool hasRun = false;
   const std::int32_t lastDay =
       lowInt32(preferences.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun));
+  const std::int32_t today = platform.statistics->BHDaysSince1970();
+  const std::int32_t next = hasRun && lastDay >= previousDay(today) ? today : previousDay(today);
   LogConclusion conclusion;
-  if (const auto obstacle = obstacleToLog(platform)) {
-    const std::int32_t today = platform.statistics->BHDaysSince1970();
-    conclusion.isOfNextRun = true;
-    conclusion.outcome = obstacle;
-    conclusion.day = hasRun && lastDay >= previousDay(today) ? today : previousDay(today);
+  conclusion.permission = submissionPermission(preferences);
+  if (!conclusion.permission.covers(next)) {
+    conclusion.outcome = LogOutcome::NotPermitted;
+  } else if (!platform.files->size(kWhitelistPath)) {
+    conclusion.outcome = LogOutcome::NoWhitelist;
+  }
+  conclusion.isOfNextRun = conclusion.outcome.has_value();
+  if (conclusion.isOfNextRun) {
+    conclusion.day = next;
   } else if (hasRun) {
     conclusion.day = lastDay;
     conclusion.outcome = lastLogOutcome(preferences);

@@ -6,6 +6,7 @@
 #include <optional>
 #include <string>
 
+#include "platform/linux/logs/submission_permission.h"
 #include "report/log_outcome.h"
 #include "tools/shared/tool_context.h"
 
@@ -15,6 +16,7 @@ struct LogConclusion {
   bool isOfNextRun = false;           // otherwise of the last gated one
   std::optional<std::int32_t> day;    // nothing before the first run
   std::optional<LogOutcome> outcome;  // nothing when it is not known
+  SubmissionPermission permission;
 
   /// "next" or "last".
   const char* run() const { return isOfNextRun ? "next" : "last"; }

@@ -48,7 +48,6 @@ struct OverlayPlatform::Services {
     platform.files = files;
     platform.locale = locale;
     platform.notifications = notifications;
-    platform.preferences = preferences;
     platform.standardStreams = streams;
     platform.statistics = store;
     platform.submission = submission;
@@ -79,7 +78,7 @@ struct OverlayPlatform::Services {
   OverlayNotifications notifications{events};
   OverlayStreams streams{events};
   OverlayStore store{platform.statistics, events};
-  OverlaySubmission submission{platform.submission, events};
+  OverlaySubmission submission{below.submission(), events};
   OverlayControls systemControls{platform.systemControls, events};
   OverlaySystemVersion systemVersion{platform.systemVersion, events};
 };

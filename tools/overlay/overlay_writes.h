@@ -10,6 +10,7 @@
 
 #include "base/format.h"
 #include "platform/linux/logs/file_crash_reporting.h"
+#include "platform/linux/logs/file_submission.h"
 #include "platform/platform.h"
 #include "tools/overlay/overlay_events.h"
 
@@ -86,10 +87,14 @@ class OverlayPreferences final : public Preferences {
 
 class OverlaySubmission final : public SubmissionService {
  public:
-  OverlaySubmission(SubmissionService& below, const OverlayEvents& events)
+  OverlaySubmission(FileSubmission& below, const OverlayEvents& events)
       : below_(below), events_(events) {}
 
-  bool isDiagnosticSubmissionEnabled() override { return below_.isDiagnosticSubmissionEnabled(); }
+  bool isDiagnosticSubmissionEnabled() override {
+    const bool isEnabled = below_.isDiagnosticSubmissionEnabled();
+    if (!isEnabled) tellDeletion();
+    return isEnabled;
+  }
   bool hasInternalDiagnostics(std::string_view identifier) override {
     return below_.hasInternalDiagnostics(identifier);
   }
@@ -101,6 +106,8 @@ class OverlaySubmission final : public SubmissionService {
     writer(file);
     plist::Dictionary what{{"type", log.type}, {"bytes", std::uint64_t{log.bytes.size()}}};
     if (options) what.set("options", options);
+    const auto place = below_.placeOfNewLog();
+    if (place && *place == FileSubmission::Place::Withheld) what.set("withheld", true);
     what.set("content", log.bytes);
     events_.tell(OverlayEvent::Kind::Submission, log.name, what);
     logs.push_back(std::move(log));
@@ -115,7 +122,8 @@ class OverlaySubmission final : public SubmissionService {
     return below_.ZTXGetDATaskingValue(key);
   }
   void submitDiagnosticLogs() override {
-    events_.tell(OverlayEvent::Kind::SendOn, "the pending logs");
+    events_.tell(OverlayEvent::Kind::SendOn,
+                 below_.maySendOn() ? "the pending logs" : "nothing: submission is not allowed");
   }
 
   std::vector<CapturedLog> logs;
@@ -130,7 +138,13 @@ class OverlaySubmission final : public SubmissionService {
     std::string& bytes_;
   };
 
-  SubmissionService& below_;
+  void tellDeletion() {
+    const std::size_t waiting = below_.countOfWaiting();
+    if (waiting == 0) return;
+    events_.tell(OverlayEvent::Kind::CleanUp, "logs that wait without permission", waiting);
+  }
+
+  FileSubmission& below_;
   const OverlayEvents& events_;
 };
 

@@ -78,6 +78,7 @@ std::string submissionText(const OverlayEvent& event) {
   if (const auto options = log.dictionary("options")) {
     text += format(", options %s", inlineText(options));
   }
+  if (log.get("withheld")) text += ", withheld: it is never sent";
   return text;
 }
 

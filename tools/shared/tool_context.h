@@ -58,6 +58,7 @@ struct ToolStreams {
   /// are then never cut.
   std::optional<std::size_t> columns = std::nullopt;
   bool errorIsTerminal = false;
+  bool inIsTerminal = false;
   /// Whether `out` is a terminal that shows colours to a user who wants them.
   bool outIsColoured = false;
 };
@@ -97,6 +98,8 @@ class ToolContext {
   std::optional<std::size_t> columns() const { return streams_.columns; }
   /// Whether to show progress of long work, on `error()`.
   bool showsProgress() const { return streams_.errorIsTerminal; }
+  /// Whether somebody can read a question and answer it.
+  bool canAsk() const { return streams_.inIsTerminal && streams_.errorIsTerminal; }
 
   // -- JSON --------------------------------------------------------------------------------------
 

@@ -257,6 +257,24 @@ Status FileSystem::makeFolders(const std::string& path) {
   return syncFolderOf(path);
 }
 
+Status FileSystem::makePrivateFolder(const std::string& path) {
+  constexpr mode_t kPrivate = 0700;
+  if (Status made = makeFolders(folderOf(path)); !made) return made;
+  if (makeFolder(path.c_str(), kPrivate) == 0) return syncFolderOf(path);
+  if (errno != EEXIST) return systemError("make the folder", path);
+  const Descriptor folder(openFile(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW, 0));
+  struct stat found {};
+  if (!folder || fstat(folder.get(), &found) != 0) return systemError("use the folder", path);
+  if ((found.st_mode & (S_IRWXG | S_IRWXO)) != 0 && fchmod(folder.get(), kPrivate) != 0) {
+    return systemError("set the mode of", path);
+  }
+  return Done{};
+}
+
+Status FileSystem::flushFolder(const std::string& folder) {
+  return status(folder) ? syncFolderOf(folder + "/.") : Done{};
+}
+
 Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, 0600);
   if (!descriptor) return descriptor;
@@ -310,9 +328,8 @@ Status FileSystem::syncFolderOf(const std::string& path) {
   return Done{};
 }
 
-// The age is measured by the file system's own clock, from the stamp of a file made just now. The
-// process's clock may be wrong, and another process may still be writing a young temporary file.
-void FileSystem::removeStaleTemporaries(const std::string& folder, const struct stat& fresh) {
+template <class IsUnwanted>
+void FileSystem::removeTemporaries(const std::string& folder, IsUnwanted isUnwanted) {
   const Folder open(opendir(folder.c_str()));
   if (!open) return;
   while (const dirent* entry = readdir(open.get())) {
@@ -320,11 +337,21 @@ void FileSystem::removeStaleTemporaries(const std::string& folder, const struct 
     const std::string path = folder + "/" + entry->d_name;
     struct stat found {};
     if (lstat(path.c_str(), &found) != 0 || !S_ISREG(found.st_mode)) continue;
-    const std::int64_t age = std::int64_t{fresh.st_mtim.tv_sec} - found.st_mtim.tv_sec;
-    if (age > limits::kTemporaryFileSeconds || age < -limits::kTemporaryFileSeconds) {
-      removeFile(path.c_str());
-    }
+    if (isUnwanted(found)) removeFile(path.c_str());
   }
+}
+
+// The age is measured by the file system's own clock, from the stamp of a file made just now. The
+// process's clock may be wrong, and another process may still be writing a young temporary file.
+void FileSystem::removeStaleTemporaries(const std::string& folder, const struct stat& fresh) {
+  removeTemporaries(folder, [&fresh](const struct stat& found) {
+    const std::int64_t age = std::int64_t{fresh.st_mtim.tv_sec} - found.st_mtim.tv_sec;
+    return age > limits::kTemporaryFileSeconds || age < -limits::kTemporaryFileSeconds;
+  });
+}
+
+void FileSystem::discardTemporaries(const std::string& folder) {
+  removeTemporaries(folder, [](const struct stat&) { return true; });
 }
 
 // -- The system's calls -------------------------------------------------------------------------

@@ -122,6 +122,13 @@ class FileSystem {
   void discard(const std::string& path) { removeFile(path.c_str()); }
   /// Makes a folder and those above it.
   Status makeFolders(const std::string& path);
+  /// The same; only its owner may use the folder itself, also when it exists already.
+  Status makePrivateFolder(const std::string& path);
+  /// Makes the removals in a folder durable; a missing folder has none.
+  Status flushFolder(const std::string& folder);
+  /// Removes the temporary files of a folder, also those that a process is writing: it can then no
+  /// longer commit them.
+  void discardTemporaries(const std::string& folder);
 
   /// Locks the file `path`, made when missing, until the handle is released. Waits for another
   /// process at most `limits::kFileLockMilliseconds`.
@@ -153,6 +160,8 @@ class FileSystem {
   Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
   Status syncFolderOf(const std::string& path);
   void removeStaleTemporaries(const std::string& folder, const struct stat& fresh);
+  template <class IsUnwanted>
+  void removeTemporaries(const std::string& folder, IsUnwanted isUnwanted);
 
   std::set<std::string> tidiedFolders_;
 };

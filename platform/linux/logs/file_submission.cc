@@ -6,7 +6,9 @@
 #include <memory>
 #include <utility>
 
+#include "base/civil_time.h"
 #include "base/limits.h"
+#include "platform/linux/files/stamp.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/persisted_state.h"
@@ -15,15 +17,14 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission";
-constexpr std::string_view kLogEnding = ".log";
+constexpr std::string_view kRefused = "/refused";
 
-// Statistics are readable by their owner and a group of operators only.
+constexpr std::size_t kWithheldLogs = 8;
+
+// Statistics are readable by their owner and a group of operators only; what is withheld, by its
+// owner.
 constexpr mode_t kMode = 0640;
-
-/// `file` without `ending`; empty when it has another.
-std::string withoutEnding(const std::string& file, std::string_view ending) {
-  return file.ends_with(ending) ? file.substr(0, file.size() - ending.size()) : std::string();
-}
+constexpr mode_t kWithheldMode = 0600;
 
 std::string join(const std::string& folder, std::string_view name, std::string_view ending) {
   std::string path = folder;
@@ -48,31 +49,61 @@ class SubmittedFile final : public LogFile {
 
 }  // namespace
 
-FileSubmission::FileSubmission(const DeviceRoot& root, FileSystem& files,
-                               PropertyListCoding& propertyLists, Preferences& preferences,
-                               LinuxSystemVersion& systemVersion, Clock& clock, SystemLog& log)
+FileSubmission::FileSubmission(const DeviceRoot& root, const Services& services,
+                               bool changesNothing)
     : folder_(root.path(kFolder)),
-      files_(files),
-      propertyLists_(propertyLists),
-      preferences_(preferences),
-      systemVersion_(systemVersion),
-      clock_(clock),
-      log_(log) {}
+      services_(services),
+      files_(services.files),
+      log_(services.log),
+      changesNothing_(changesNothing) {}
 
+std::int32_t FileSubmission::today() const {
+  return services_.reportedDays.BHDaysSince1970();
+}
+
+// Gated and forced runs report the day before. A run that reports its own, unfinished day gets the
+// same answer, and one that is told an older day is refused when it files its log.
 bool FileSubmission::isDiagnosticSubmissionEnabled() {
-  return preferences_.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain);
+  services_.reportedDays.takeEarliest();
+  const SubmissionPermission permission = submissionPermission(services_.preferences);
+  if (permission.covers(std::int64_t{today()} - 1)) return true;
+  if (permission.isGiven) {
+    log_.log(LogLevel::Info,
+             "submission is %s: that day's log is made when the day is over, none before",
+             textOf(permission));
+  } else if (!changesNothing_) {
+    completeWithdrawal();
+  }
+  return false;
+}
+
+// The switch may have been turned off by hand, and a deletion may have been cut off. Preferences
+// that cannot be read may hold a permission: nothing is sent, and nothing deleted.
+void FileSubmission::completeWithdrawal() {
+  const auto stored = storedSubmissionPermission(services_.filePreferences);
+  if (!stored || stored->isGiven) return;
+  if (stored->firstDay) {
+    setSubmissionPermission(services_.preferences, {});
+    services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
+  }
+  const RemovedLogs removed = removeLogs({folder(Place::Pending), folder(Place::Outbox)}, true);
+  if (removed.logs > 0) {
+    log_.log(LogLevel::Default, "submission is not allowed: %zu waiting log%s deleted",
+             removed.logs, removed.logs == 1 ? "" : "s");
+  }
+  if (removed.failure) log_.write(LogLevel::Error, removed.failure->message);
 }
 
 bool FileSubmission::hasInternalDiagnostics(std::string_view identifier) {
-  return preferences_.ZTXPreferencesGetBoolValue(identifier, kDiagnosticsDomain);
+  return services_.preferences.ZTXPreferencesGetBoolValue(identifier, kDiagnosticsDomain);
 }
 
 std::string FileSubmission::ZTXOSVersion() {
-  return systemVersion_.text();
+  return services_.systemVersion.text();
 }
 
 plist::Value FileSubmission::ZTXGetDATaskingValue(std::string_view key) {
-  return preferences_.ZTXPreferencesGetValue(key, kTaskingDomain);
+  return services_.preferences.ZTXPreferencesGetValue(key, kTaskingDomain);
 }
 
 bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
@@ -86,52 +117,88 @@ bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::str
   return static_cast<bool>(filed);
 }
 
+Expected<FileSubmission::Place> FileSubmission::placeOfNewLog() {
+  const auto statisticsDay = services_.reportedDays.takeEarliest();
+  const SubmissionPermission permission = submissionPermission(services_.preferences);
+  if (permission.covers(statisticsDay.value_or(today()))) return Place::Pending;
+  if (!statisticsDay) return Place::Withheld;
+  return Error{format("it holds statistics of day %lld (%s), and submission is %s", *statisticsDay,
+                      dateText(civilFromDays(*statisticsDay)), textOf(permission))};
+}
+
 Status FileSubmission::fileLog(std::string_view logType, std::string_view logName,
                                const plist::Dictionary& options, const LogWriter& writer) {
-  const plist::Date now = clock_.now();
+  const auto place = placeOfNewLog();
+  if (!place) return place.error();
+  const plist::Date now = services_.clock.now();
   plist::Dictionary metadata{{kLogMetadataType, logType},
                              {kLogMetadataName, logName},
                              {kLogMetadataTime, now},
-                             {kLogMetadataVersion, systemVersion_.text()}};
+                             {kLogMetadataVersion, services_.systemVersion.text()}};
   metadata.set(kLogMetadataOptions, options);
-  const auto metadataBytes = propertyLists_.encodeXml(metadata);
+  const auto metadataBytes = services_.propertyLists.encodeXml(metadata);
   if (!metadataBytes) return metadataBytes.error();
 
+  if (*place == Place::Withheld) {
+    if (Status made = files_.makePrivateFolder(folder(*place)); !made) return made;
+  }
   const std::string name = newLogFileName(logName, now);
-  const std::string logPath = join(folder(Place::Pending), name, kLogEnding);
-  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
-
-  Expected<NewFile> file = files_.create(logPath, kMode);
+  Expected<NewFile> file = files_.create(join(folder(*place), name, kLogEnding),
+                                         *place == Place::Withheld ? kWithheldMode : kMode);
   if (!file) return file.error();
   SubmittedFile handle(*file);
   writer(handle);
   if (!handle.status()) return handle.status();
   if (Status flushed = file->flush(); !flushed) return flushed;
+  return commit(*file, *place, name, *metadataBytes);
+}
 
-  Status done = files_.replace(metadataPath, asBytes(*metadataBytes), kMode);
+Status FileSubmission::commit(NewFile& file, Place place, const std::string& name,
+                              const std::string& metadata) {
+  const bool isWithheld = place == Place::Withheld;
+  const auto lock = files_.lockFolder(folder_);
+  if (!lock) return lock.error();
+  if (!isWithheld) {
+    if (Status permitted = checkPermission(); !permitted) return permitted;
+  }
+  const std::string metadataPath = join(folder(place), name, kLogMetadataEnding);
+  Status done = files_.replace(metadataPath, asBytes(metadata), isWithheld ? kWithheldMode : kMode);
   if (done) {
-    removeOldMetadata(metadataPath);
-    done = file->commit();
+    removeOldMetadata(folder(place), metadataPath);
+    done = file.commit();
   }
   if (!done) {
     // The log goes first: as long as it can be seen, its metadata can.
-    files_.discard(logPath);
+    files_.discard(join(folder(place), name, kLogEnding));
     files_.discard(metadataPath);
+    return done;
   }
-  return done;
+  if (isWithheld) {
+    log_.log(LogLevel::Info, "log \"%s\" is withheld: submission is %s", name,
+             textOf(submissionPermission(services_.preferences)));
+    keepNewestLogs(files_, folder(place), kWithheldLogs, name);
+  }
+  return Done{};
+}
+
+Status FileSubmission::checkPermission() const {
+  const auto stored = storedSubmissionPermission(services_.filePreferences);
+  if (!stored) return stored.error();
+  if (!stored->isGiven) return Error{"submission is no longer allowed"};
+  return Done{};
 }
 
 // Removes what a process left that was killed while filing a log. Ages are measured by the file
 // system's own clock, from the stamp of a file made just now.
-void FileSubmission::removeOldMetadata(const std::string& freshMetadata) {
+void FileSubmission::removeOldMetadata(const std::string& folder,
+                                       const std::string& freshMetadata) {
   const auto fresh = FileSystem::status(freshMetadata);
-  const auto names = files_.list(folder(Place::Pending));
+  const auto names = files_.list(folder);
   if (!fresh || !names) return;
   for (const std::string& file : *names) {
     const std::string name = withoutEnding(file, kLogMetadataEnding);
-    if (name.empty() || FileSystem::status(join(folder(Place::Pending), name, kLogEnding)))
-      continue;
-    const std::string path = join(folder(Place::Pending), file, {});
+    if (name.empty() || FileSystem::status(join(folder, name, kLogEnding))) continue;
+    const std::string path = join(folder, file, {});
     const auto found = FileSystem::status(path);
     if (found && fresh->st_mtim.tv_sec - found->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
       files_.discard(path);
@@ -140,6 +207,10 @@ void FileSubmission::removeOldMetadata(const std::string& freshMetadata) {
 }
 
 void FileSubmission::submitDiagnosticLogs() {
+  if (Status permitted = checkPermission(); !permitted) {
+    log_.log(LogLevel::Info, "no log is sent on: %s", permitted.error().message);
+    return;
+  }
   const auto files = files_.list(folder(Place::Pending));
   if (!files) {
     log_.write(LogLevel::Error, files.error().message);
@@ -157,7 +228,9 @@ void FileSubmission::submitDiagnosticLogs() {
       }
       continue;
     }
-    if (Status moved = moveToOutbox(name); !moved) {
+    // What another process has sent on or deleted in the meantime needs no line.
+    if (Status moved = moveToOutbox(name);
+        !moved && FileSystem::status(join(folder(Place::Pending), file, {}))) {
       log_.log(LogLevel::Error, "cannot move log \"%s\" to the outbox: %s", name,
                moved.error().message);
     }
@@ -165,6 +238,9 @@ void FileSubmission::submitDiagnosticLogs() {
 }
 
 Status FileSubmission::moveToOutbox(const std::string& name) {
+  const auto lock = files_.lockFolder(folder_);
+  if (!lock) return lock.error();
+  if (Status permitted = checkPermission(); !permitted) return permitted;
   const std::string outbox = folder(Place::Outbox);
   const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
   const auto metadata = files_.readIfPresent(metadataPath, limits::kPropertyListBytes);
@@ -209,7 +285,7 @@ void FileSubmission::readMetadata(FiledLog& log) {
   const auto bytes = files_.readIfPresent(join(folder(log.place), log.name, kLogMetadataEnding),
                                           limits::kPropertyListBytes);
   if (!bytes || !*bytes) return;
-  if (const auto value = propertyLists_.decode(asBytes(**bytes))) {
+  if (const auto value = services_.propertyLists.decode(asBytes(**bytes))) {
     log.metadata = value->dictionary();
   }
 }
@@ -227,8 +303,40 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::logs(Place place
   return logs;
 }
 
+std::size_t FileSubmission::countOfWaiting() const {
+  const auto stored = storedSubmissionPermission(services_.filePreferences);
+  if (!stored || stored->isGiven) return 0;
+  std::size_t waiting = 0;
+  for (const Place place : {Place::Pending, Place::Outbox}) {
+    const auto found = count(place);
+    waiting += found ? *found : 0;
+  }
+  return waiting;
+}
+
+RemovedLogs FileSubmission::removeWaiting() {
+  return removeLogs({folder(Place::Pending), folder(Place::Outbox)}, false);
+}
+
+RemovedLogs FileSubmission::removeAll() {
+  return removeLogs({folder(Place::Pending), folder(Place::Outbox), folder(Place::Withheld),
+                     folder_ + std::string(kRefused)},
+                    false);
+}
+
+// Logs move from pending to the outbox, so in this order none escapes.
+RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
+                                       bool onlyWithoutPermission) {
+  if (!FileSystem::status(folder_)) return {};
+  const auto lock = files_.lockFolder(folder_);
+  if (!lock) return {0, lock.error()};
+  if (onlyWithoutPermission && checkPermission()) return {};
+  return removeLogsIn(files_, folders);
+}
+
 std::string FileSubmission::folder(Place place) const {
-  return folder_ + (place == Place::Pending ? "/pending" : "/outbox");
+  constexpr const char* kNames[] = {"/pending", "/outbox", "/withheld"};
+  return folder_ + kNames[static_cast<std::size_t>(place)];
 }
 
 }  // namespace tavrel

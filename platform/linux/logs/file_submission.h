@@ -4,6 +4,13 @@
 // .../Submission/outbox/, which an uploader empties. A log is "<name>-<stamp>-<unique>.log"; its
 // metadata is a property list beside it, "<name>-<stamp>-<unique>.metadata.plist".
 //
+// Only what the owner permits gets there (submission_permission.h). A log of statistics that he
+// does not permit is not filed. Any other one goes to .../Submission/withheld/, which nothing sends
+// and only root reads, and of which the newest eight stay.
+//
+// Whoever puts a log in place, moves it on or deletes what waits locks the folder Submission, and
+// then asks storage for the permission: after a withdrawal nothing is filed or sent on.
+//
 // The metadata appears before the log and disappears after it, so each visible log has its
 // metadata. Metadata without a log comes from a killed process, means nothing, and is removed once
 // it is older than `limits::kTemporaryFileSeconds`.
@@ -18,15 +25,16 @@
 #include "platform/linux/device/linux_system_version.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/log_folder.h"
+#include "platform/linux/logs/reported_days.h"
+#include "platform/linux/logs/submission_permission.h"
+#include "platform/linux/preferences/file_preferences.h"
 #include "platform/preferences.h"
 #include "platform/property_list_coding.h"
 #include "platform/submission.h"
 #include "platform/system_log.h"
 
 namespace tavrel {
-
-/// The end of the name of a log's metadata, which begins as the log's.
-inline constexpr std::string_view kLogMetadataEnding = ".metadata.plist";
 
 /// Entries of a log's metadata.
 inline constexpr std::string_view kLogMetadataType = "LogType";       // string
@@ -37,7 +45,7 @@ inline constexpr std::string_view kLogMetadataOptions = "Options";    // diction
 
 class FileSubmission final : public SubmissionService {
  public:
-  enum class Place { Pending, Outbox };
+  enum class Place { Pending, Outbox, Withheld };
 
   /// A log that has been filed.
   struct FiledLog {
@@ -47,17 +55,43 @@ class FileSubmission final : public SubmissionService {
     plist::Dictionary metadata;  // empty when missing or unreadable
   };
 
-  FileSubmission(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
-                 Preferences& preferences, LinuxSystemVersion& systemVersion, Clock& clock,
-                 SystemLog& log);
+  struct Services {
+    FileSystem& files;
+    PropertyListCoding& propertyLists;
+    Preferences& preferences;          // of the run
+    FilePreferences& filePreferences;  // as storage has them
+    ReportedDays& reportedDays;        // the store of which daily logs are made
+    LinuxSystemVersion& systemVersion;
+    Clock& clock;
+    SystemLog& log;
+  };
+  /// All services must outlive it. `changesNothing`: what waits without permission stays.
+  FileSubmission(const DeviceRoot& root, const Services& services, bool changesNothing = false);
 
+  /// Whether statistics of yesterday may leave; an info line says why not, if the owner has allowed
+  /// later days. A run asks before it makes its log. When the owner allows nothing, this deletes
+  /// what still waits, as `removeWaiting` does, and a first day that is left over.
   bool isDiagnosticSubmissionEnabled() override;
   bool hasInternalDiagnostics(std::string_view identifier) override;
   bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
                                 const plist::Dictionary& options, const LogWriter& writer) override;
   std::string ZTXOSVersion() override;
   plist::Value ZTXGetDATaskingValue(std::string_view key) override;
+  /// Without permission nothing is sent on; an info line says so.
   void submitDiagnosticLogs() override;
+
+  /// Where a log that is made now, of the rows read last, would go; an error when nowhere.
+  Expected<Place> placeOfNewLog();
+
+  /// Whether `submitDiagnosticLogs` sends anything on.
+  bool maySendOn() const { return static_cast<bool>(checkPermission()); }
+  /// What a run without permission deletes: 0 while storage has one or cannot be read.
+  std::size_t countOfWaiting() const;
+
+  /// Deletes the logs that wait in pending and outbox.
+  RemovedLogs removeWaiting();
+  /// Deletes the logs of all folders, also what is withheld and what a server has refused.
+  RemovedLogs removeAll();
 
   /// The logs of one place in the order of their names, which `parseLogFileName` reads; no file is
   /// opened and `metadata` is empty.
@@ -71,18 +105,23 @@ class FileSubmission final : public SubmissionService {
 
  private:
   std::string folder(Place place) const;
+  std::int32_t today() const;
   Status fileLog(std::string_view logType, std::string_view logName,
                  const plist::Dictionary& options, const LogWriter& writer);
+  /// Puts a written log in place, if it may still go there.
+  Status commit(NewFile& file, Place place, const std::string& name, const std::string& metadata);
   Status moveToOutbox(const std::string& name);
-  void removeOldMetadata(const std::string& freshMetadata);
+  void removeOldMetadata(const std::string& folder, const std::string& freshMetadata);
+  /// An error when storage does not have the owner's permission.
+  Status checkPermission() const;
+  RemovedLogs removeLogs(const std::vector<std::string>& folders, bool onlyWithoutPermission);
+  void completeWithdrawal();
 
   std::string folder_;
+  Services services_;
   FileSystem& files_;
-  PropertyListCoding& propertyLists_;
-  Preferences& preferences_;
-  LinuxSystemVersion& systemVersion_;
-  Clock& clock_;
   SystemLog& log_;
+  bool changesNothing_;
 };
 
 }  // namespace tavrel

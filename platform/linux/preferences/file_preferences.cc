@@ -94,6 +94,14 @@ plist::Dictionary FilePreferences::values(std::string_view domain) {
   return plist::deepCopy(merged).dictionary();
 }
 
+Expected<plist::Dictionary> FilePreferences::storedValues(std::string_view domain) {
+  const std::string path = pathOf(domain);
+  auto content = readContent(path);
+  if (!content) return content.error();
+  if (content->fault.empty()) return content->values;
+  return Error{"cannot read preferences " + path + ": " + content->fault + "; repair it"};
+}
+
 FilePreferences::Domain& FilePreferences::domainNamed(std::string_view domain) {
   const auto found = domains_.find(domain);
   return found != domains_.end() ? found->second : domains_[std::string(domain)];

@@ -48,6 +48,10 @@ class FilePreferences final : public Preferences {
   /// All keys of a domain as this process sees them; the caller's own.
   plist::Dictionary values(std::string_view domain);
 
+  /// A domain as its file has it at this moment, without this process's changes; an empty handle
+  /// when there is no file. Unlike the look-ups it fails when the file cannot be read.
+  Expected<plist::Dictionary> storedValues(std::string_view domain);
+
   /// Whether `domain` can name a file: not empty, at most `limits::kPreferenceDomainBytes` bytes,
   /// without slashes and control characters, not beginning with a dot.
   static bool isValidDomain(std::string_view domain);

@@ -70,7 +70,10 @@ class SqliteBatch {
   /// Keeps the changes and ends the batch.
   Status commit();
 
-  /// As `setScalar` and `commit`, for use inside the store: they throw `StoreFailure`.
+  /// Makes other writers wait, gives the store the present schema and takes kept values in; for use
+  /// inside the store, as what follows: they throw `StoreFailure`.
+  void begin();
+  /// As `setScalar` and `commit`.
   void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void finish();
   /// The connection, when the batch has been finished.
@@ -87,7 +90,6 @@ class SqliteBatch {
     std::int64_t value;
   };
 
-  void begin();
   void takeKeptValues();
   void setDamagedValuesAside();
   void removeTakenValues();

@@ -11,16 +11,6 @@
 namespace tavrel {
 namespace {
 
-// The first key above every key that begins with `prefix`; nothing when there is none.
-std::optional<std::string> keyAbove(std::string_view prefix) {
-  std::string above(prefix);
-  while (!above.empty() && above.back() == '\xFF')
-    above.pop_back();
-  if (above.empty()) return std::nullopt;
-  above.back() = static_cast<char>(static_cast<unsigned char>(above.back()) + 1);
-  return above;
-}
-
 StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
   // The beginning of a long key says enough.
   constexpr std::size_t kShownBytes = 200;
@@ -110,7 +100,7 @@ struct SqliteHistory::Selection {
   std::int64_t firstDay;
   std::int64_t lastDay;
   Order order;
-  std::optional<std::string> keyAbovePrefix = keyAbove(prefix);
+  std::optional<std::string> keyAbovePrefix = store_sql::keyAbove(prefix);
 
   /// The days above `minDay` and not above `maxDay`.
   static Selection between(std::string_view prefix, std::int64_t minDay, std::int64_t maxDay) {

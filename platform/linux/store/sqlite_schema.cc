@@ -120,6 +120,15 @@ bool isReadable(SqliteConnection& connection) {
 
 }  // namespace
 
+std::optional<std::string> store_sql::keyAbove(std::string_view prefix) {
+  std::string above(prefix);
+  while (!above.empty() && above.back() == '\xFF')
+    above.pop_back();
+  if (above.empty()) return std::nullopt;
+  above.back() = static_cast<char>(static_cast<unsigned char>(above.back()) + 1);
+  return above;
+}
+
 std::string store_sql::scalars(std::string_view rows) {
   return std::string("SELECT key, day, value FROM scalars ").append(rows);
 }

@@ -41,6 +41,9 @@ std::string scalars(std::string_view rows);
 /// (chunk_runs.h), or a series in version 1.
 std::string distributions(std::string_view rows, std::int64_t version);
 
+/// The first key above every key that begins with `prefix`; nothing when there is none.
+std::optional<std::string> keyAbove(std::string_view prefix);
+
 /// ?1 first chunk, ?2 chunk behind the last.
 inline constexpr std::string_view kChunks =
     "SELECT chunk, data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";

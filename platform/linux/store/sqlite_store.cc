@@ -151,6 +151,24 @@ void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
   if (failure) site_.tell(*failure);
 }
 
+Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
+  ErasedRows erased;
+  const auto failure = attempt([&](const auto& identity) {
+    if (!identity && !KeptValues(site_.path).exist()) return;
+    SqliteBatch batch(openForWriting(), site_);
+    batch.begin();
+    batch.finish();
+    SqliteConnection connection = batch.release();
+    StoreErasure erasure(connection, site_.path);
+    erasure.clearFreePages();
+    erased = erasure.eraseRows(range);
+    if (range == RowRange()) erasure.shrink();
+    erased.isLogEmpty = erasure.emptyLog();
+  });
+  if (failure) return Error{site_.describe(*failure)};
+  return erased;
+}
+
 std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
     const std::optional<FileIdentity>& identity) {
   return std::make_unique<SqliteHistory>(

@@ -25,6 +25,7 @@
 #include "platform/clock.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/store/sqlite_batch.h"
+#include "platform/linux/store/sqlite_erasure.h"
 #include "platform/linux/store/sqlite_history.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/preferences.h"
@@ -61,6 +62,10 @@ class SqliteStore : public StatisticsStore {
 
   /// The history with its wider set of queries; without rows when there is no store yet.
   Expected<std::unique_ptr<SqliteHistory>> openHistory();
+
+  /// Removes rows, also those that are kept beside the store, and overwrites what they held. When
+  /// all rows go, gives their space back. After a failure some may be gone.
+  Expected<ErasedRows> erase(const RowRange& range);
 
  private:
   SqliteConnection openForWriting();

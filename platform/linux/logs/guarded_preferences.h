@@ -1,0 +1,43 @@
+// Preferences as a run gets them: what a tasking contains cannot change what the owner allows.
+//
+// 'tavrelctl', which the owner uses, writes preferences without this guard.
+#pragma once
+
+#include <string_view>
+
+#include "platform/persisted_state.h"
+#include "platform/preferences.h"
+#include "platform/system_log.h"
+
+namespace tavrel {
+
+class GuardedPreferences final : public Preferences {
+ public:
+  /// Both must outlive it.
+  GuardedPreferences(Preferences& preferences, SystemLog& log)
+      : preferences_(preferences), log_(log) {}
+
+  plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) override {
+    return preferences_.ZTXPreferencesGetValue(key, domain);
+  }
+  /// A change of the permission is dropped with a line.
+  void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
+                              std::string_view domain) override {
+    const bool isPermission = domain == kDiagnosticsDomain &&
+                              (key == kSubmissionEnabledKey || key == kSubmissionFirstDayKey);
+    if (!isPermission) return preferences_.ZTXPreferencesSetValue(key, value, domain);
+    log_.log(
+        LogLevel::Error,
+        "a tasking may not change preference %s of domain %s: only the owner allows submission",
+        key, domain);
+  }
+  bool ZTXPreferencesSynchronize(std::string_view domain) override {
+    return preferences_.ZTXPreferencesSynchronize(domain);
+  }
+
+ private:
+  Preferences& preferences_;
+  SystemLog& log_;
+};
+
+}  // namespace tavrel

@@ -1,0 +1,42 @@
+#include "platform/linux/logs/reported_days.h"
+
+#include <algorithm>
+
+#include "base/arithmetic.h"
+
+namespace tavrel {
+
+class ReportedDays::History final : public BHHistory {
+ public:
+  History(std::unique_ptr<BHHistory> history, std::optional<std::int64_t>& earliest)
+      : history_(std::move(history)), earliest_(earliest) {}
+
+  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                           std::int64_t maxDaysSince1970,
+                           const ScalarRowHandler& rowHandler) override {
+    note(minDaysSince1970);
+    history_->scalarsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970, rowHandler);
+  }
+  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+                                 std::int64_t maxDaysSince1970,
+                                 const DistributionRowHandler& rowHandler) override {
+    note(minDaysSince1970);
+    history_->distributionsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970, rowHandler);
+  }
+
+ private:
+  // Rows begin on the day after the bound.
+  void note(std::int64_t dayBefore) {
+    const std::int64_t day = wrappingAdd(dayBefore, std::int64_t{1});
+    earliest_ = std::min(earliest_.value_or(day), day);
+  }
+
+  std::unique_ptr<BHHistory> history_;
+  std::optional<std::int64_t>& earliest_;
+};
+
+std::unique_ptr<BHHistory> ReportedDays::initWithDefaultPath() {
+  return std::make_unique<History>(store_.initWithDefaultPath(), earliest_);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,53 @@
+#include "platform/linux/logs/submission_permission.h"
+
+#include <limits>
+
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/persisted_state.h"
+#include "platform/preferences.h"
+
+namespace tavrel {
+namespace {
+
+std::optional<std::int32_t> firstDayOf(const plist::Value& stored) {
+  if (stored.isNull()) return std::nullopt;
+  constexpr auto kNever = std::numeric_limits<std::int32_t>::max();
+  const auto number = stored.number();
+  const std::int64_t day = number ? number->int64() : kNever;
+  const bool isDay = day >= std::numeric_limits<std::int32_t>::min() && day <= kNever;
+  return isDay ? static_cast<std::int32_t>(day) : kNever;
+}
+
+}  // namespace
+
+SubmissionPermission submissionPermission(Preferences& preferences) {
+  if (!preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain)) return {};
+  return {true, firstDayOf(preferences.ZTXPreferencesGetValue(kSubmissionFirstDayKey,
+                                                              kDiagnosticsDomain))};
+}
+
+Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& preferences) {
+  const auto values = preferences.storedValues(kDiagnosticsDomain);
+  if (!values) return values.error();
+  return SubmissionPermission{values->get(kSubmissionEnabledKey).boolean().value_or(false),
+                              firstDayOf(values->get(kSubmissionFirstDayKey))};
+}
+
+void setSubmissionPermission(Preferences& preferences, const SubmissionPermission& permission) {
+  preferences.ZTXPreferencesSetValue(kSubmissionEnabledKey, permission.isGiven, kDiagnosticsDomain);
+  preferences.ZTXPreferencesSetValue(
+      kSubmissionFirstDayKey,
+      permission.firstDay ? plist::Value(*permission.firstDay) : plist::Value(),
+      kDiagnosticsDomain);
+}
+
+std::string textOf(const SubmissionPermission& permission) {
+  if (!permission.isGiven) return "not allowed";
+  if (!permission.firstDay) return "allowed";
+  return format("allowed from day %d (%s) on", *permission.firstDay,
+                dateText(civilFromDays(*permission.firstDay)));
+}
+
+}  // namespace tavrel

@@ -1,0 +1,177 @@
+#include "platform/linux/store/sqlite_erasure.h"
+
+#include <algorithm>
+#include <optional>
+#include <utility>
+
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/store/chunk_runs.h"
+#include "platform/linux/store/sqlite_schema.h"
+
+namespace tavrel {
+namespace {
+
+// What one transaction removes at most; a single distribution may have more chunks.
+constexpr int kRowsAtOnce = 512;
+constexpr std::int64_t kChunksAtOnce = 4096;
+
+// Pages that one transaction overwrites, 1 MiB of the usual ones.
+constexpr std::int64_t kPagesAtOnce = 256;
+
+constexpr off_t kLogBytes = 1 << 20;
+
+std::string statement(std::string_view before, std::string_view table, std::string_view after) {
+  std::string sql(before);
+  sql += table;
+  sql += after;
+  return sql;
+}
+
+/// The first day from `day` on that has a row.
+std::optional<std::int64_t> nextDay(SqliteConnection& connection, std::string_view table,
+                                    std::int64_t day) {
+  SqliteStatement rows(
+      connection, statement("SELECT day FROM ", table, " WHERE day >= ?1 ORDER BY day LIMIT 1"));
+  rows.bind(1, day);
+  if (!rows.step()) return std::nullopt;
+  return rows.integer(0);
+}
+
+std::vector<std::string> nextKeys(SqliteConnection& connection, std::string_view table,
+                                  std::int64_t day, const std::string& prefix) {
+  SqliteStatement rows(connection,
+                       statement("SELECT key FROM ", table,
+                                 " WHERE day = ?1 AND key >= ?2 AND (?3 IS NULL OR key < ?3) "
+                                 "ORDER BY key LIMIT ?4"));
+  const auto above = store_sql::keyAbove(prefix);
+  rows.bind(1, day);
+  rows.bind(2, std::string_view(prefix));
+  if (above) {
+    rows.bind(3, std::string_view(*above));
+  } else {
+    rows.bindNull(3);
+  }
+  rows.bind(4, kRowsAtOnce);
+  std::vector<std::string> keys;
+  while (rows.step())
+    keys.emplace_back(rows.bytes(0));
+  return keys;
+}
+
+}  // namespace
+
+StoreErasure::StoreErasure(SqliteConnection& connection, std::string storePath)
+    : connection_(connection), path_(std::move(storePath)) {
+  // Of the pages that become free, too. A copy that SQLite makes of the rest is not on storage.
+  connection_.execute("PRAGMA secure_delete = ON; PRAGMA temp_store = MEMORY");
+}
+
+void StoreErasure::limitLog() {
+  const auto log = FileSystem::status(path_ + "-wal");
+  if (log && log->st_size > kLogBytes) connection_.checkpoint(false);
+}
+
+// Rows of zeros take the free pages, as many as there are, and give them back.
+void StoreErasure::clearFreePages() {
+  connection_.execute("DROP TABLE IF EXISTS erased");
+  std::int64_t free = connection_.integer("PRAGMA freelist_count");
+  if (free == 0) return;
+  const std::int64_t pageBytes = connection_.integer("PRAGMA page_size");
+  connection_.execute("CREATE TABLE erased (zeros BLOB)");
+  SqliteStatement fill(connection_, "INSERT INTO erased (zeros) VALUES (zeroblob(?1))");
+  while (free > 0) {
+    const std::int64_t pages = std::min(free, kPagesAtOnce);
+    fill.bind(1, pages * pageBytes);
+    fill.run();
+    limitLog();
+    free = std::min(free - pages, connection_.integer("PRAGMA freelist_count"));
+  }
+  connection_.execute("PRAGMA secure_delete = OFF; DROP TABLE erased; PRAGMA secure_delete = ON");
+}
+
+ErasedRows StoreErasure::eraseRows(const RowRange& range) {
+  ErasedRows erased;
+  for (const std::string_view table : {"scalars", "distributions"})
+    eraseTable(table, range, erased);
+  return erased;
+}
+
+void StoreErasure::eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased) {
+  auto day = nextDay(connection_, table, range.firstDay);
+  while (day && *day <= range.lastDay) {
+    const auto keys = nextKeys(connection_, table, *day, range.prefix);
+    if (keys.empty()) {
+      day = nextDay(connection_, table, *day + 1);
+    } else {
+      eraseKeys(table, *day, keys, erased);
+    }
+  }
+}
+
+void StoreErasure::eraseKeys(std::string_view table, std::int64_t day,
+                             const std::vector<std::string>& keys, ErasedRows& erased) {
+  ErasedRows sum = erased;
+  connection_.execute("BEGIN IMMEDIATE");
+  {
+    SqliteStatement removeRow(connection_,
+                              statement("DELETE FROM ", table, " WHERE day = ?1 AND key = ?2"));
+    SqliteStatement row(connection_,
+                        "SELECT count, runs FROM distributions WHERE day = ?1 AND key = ?2");
+    SqliteStatement removeChunks(connection_,
+                                 "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
+    std::int64_t chunks = 0;
+    for (const std::string& key : keys) {
+      if (chunks >= kChunksAtOnce) break;
+      if (table == "distributions") {
+        row.bind(1, day);
+        row.bind(2, std::string_view(key));
+        // Another process may have removed it since.
+        const bool isThere = row.step();
+        const auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
+        sum.distributions += isThere ? 1 : 0;
+        sum.values +=
+            isThere ? static_cast<std::uint64_t>(std::max<std::int64_t>(row.integer(0), 0)) : 0;
+        sum.damaged += isThere && !runs ? 1 : 0;
+        row.reset();
+        for (const ChunkRun& run : runs.value_or(std::vector<ChunkRun>())) {
+          removeChunks.bind(1, run.first);
+          removeChunks.bind(2, run.end());
+          removeChunks.run();
+          chunks += run.end() - run.first;
+        }
+      } else {
+        ++sum.scalars;
+      }
+      removeRow.bind(1, day);
+      removeRow.bind(2, std::string_view(key));
+      removeRow.run();
+    }
+  }
+  connection_.execute("COMMIT");
+  erased = sum;
+  limitLog();
+}
+
+void StoreErasure::eraseStrayChunks() {
+  bool isDone = false;
+  while (!isDone) {
+    connection_.execute("BEGIN IMMEDIATE");
+    // What another process has recorded in the meantime has rows.
+    if (connection_.integer("SELECT count(*) FROM (SELECT 1 FROM distributions LIMIT 1)") == 0) {
+      connection_.execute(
+          "DELETE FROM chunks WHERE chunk IN (SELECT chunk FROM chunks LIMIT 4096)");
+      isDone = connection_.integer("SELECT changes()") == 0;
+    } else {
+      isDone = true;
+    }
+    connection_.execute("COMMIT");
+    limitLog();
+  }
+}
+
+void StoreErasure::shrink() {
+  eraseStrayChunks();
+  connection_.execute("VACUUM");
+}
+
+}  // namespace tavrel

@@ -1,0 +1,184 @@
+#include "tools/consent/permission_commands.h"
+
+#include <algorithm>
+#include <limits>
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "base/format.h"
+#include "platform/linux/folding/recorded_history.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/store/kept_values.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/persisted_state.h"
+#include "platform/platform.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+struct AllowArguments {
+  std::string from;
+};
+
+/// The latest day of which anything is recorded, wherever that is; nothing when nothing is.
+Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
+  Platform& platform = context.platform();
+  const Recorders recorders = Recorders::read(context.root(), context.linuxPlatform().fileSystem(),
+                                              platform.propertyLists, platform.log);
+  SqliteStore& store = context.storeForReading();
+  const RowSelection everything{.key = {},
+                                .firstDay = std::numeric_limits<std::int32_t>::min(),
+                                .lastDay = std::numeric_limits<std::int32_t>::max(),
+                                .hasValues = false};
+  auto history = RecordedHistory::open(context.root(), store, recorders, everything);
+  if (!history) return history.error();
+  if (history->warning()) return Error{*history->warning()};
+  const auto days = history->daysHeld();
+  if (!days) return days.error();
+  std::optional<std::int32_t> latest;
+  if (*days) latest = (*days)->last;
+  const auto kept = KeptValues(store.path()).read();
+  if (!kept) return kept.error();
+  if (*kept) {
+    for (const KeptValue& value : **kept)
+      latest = std::max(latest.value_or(value.day), value.day);
+  }
+  return latest;
+}
+
+/// The first day of a permission that is given now: nothing of it has been recorded yet, even when
+/// the clock was or is wrong.
+Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today) {
+  const auto latest = latestRecordedDay(context);
+  if (!latest) {
+    return Error{format("%s; 'tavrelctl allow --from DAY' does not look at what is recorded",
+                        latest.error().message)};
+  }
+  const std::int32_t last = std::max(latest->value_or(today), today);
+  if (last == std::numeric_limits<std::int32_t>::max()) {
+    return Error{"no day is later than what is recorded: erase that, or give --from DAY"};
+  }
+  if (last > today) {
+    context.note(
+        format("day %s is recorded already, though today is %s: submission begins after "
+               "it; give --from DAY if a wrong clock recorded it",
+               dayText(last), dayText(today)));
+  }
+  return last + 1;
+}
+
+bool store(ToolContext& context, const SubmissionPermission& permission) {
+  FilePreferences& preferences = context.preferences();
+  setSubmissionPermission(preferences, permission);
+  if (!preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain)) return false;
+  const auto stored = storedSubmissionPermission(preferences);
+  return stored && *stored == permission;
+}
+
+void printAllowed(ToolContext& context, const SubmissionPermission& permission, bool isNew) {
+  if (context.json()) {
+    const auto day = permission.firstDay;
+    return context.printJson(
+        {{"submission_allowed", true},
+         {"submission_first_day",
+          day ? Json({{"day", *day}, {"date", dayDateText(*day)}}) : Json(nullptr)},
+         {"changed", isNew}});
+  }
+  context.out() << "submission is " << (isNew ? "" : "already ") << textOf(permission) << '\n';
+}
+
+void allow(ToolContext& context, const AllowArguments& arguments) {
+  const auto stored = storedSubmissionPermission(context.preferences());
+  if (!stored) return context.fail(stored.error().message);
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
+  const bool isNamed = !arguments.from.empty();
+  auto first = parseDay(arguments.from, today);
+  if (isNamed && !first) return context.failUsage(first.error().message);
+  if (!isNamed && stored->isGiven && !stored->firstDay)
+    return printAllowed(context, *stored, false);
+  if (!isNamed) first = firstDayFromNow(context, today);
+  if (!first) return context.fail(first.error().message);
+
+  // What waits was permitted; a later first day would withdraw that in part.
+  if (stored->isGiven && (!stored->firstDay || *first > *stored->firstDay)) {
+    if (!isNamed) return printAllowed(context, *stored, false);
+    return context.fail(format("submission is already %s: a later day needs 'tavrelctl deny' first",
+                               textOf(*stored)));
+  }
+  const SubmissionPermission permission{true, *first};
+  if (*stored == permission) return printAllowed(context, permission, false);
+  if (!stored->isGiven) {
+    const RemovedLogs removed = context.linuxPlatform().submission().removeWaiting();
+    if (removed.logs > 0) {
+      context.note(format("%s of an earlier permission deleted",
+                          counted(std::uint64_t{removed.logs}, "waiting log")));
+    }
+    if (removed.failure) return context.fail(removed.failure->message);
+  }
+  if (!store(context, permission)) {
+    return context.hasComplaints()
+               ? context.setExitStatus(kExitFailure)
+               : context.fail("the permission was changed at the same moment: run it again");
+  }
+  printAllowed(context, permission, true);
+  if (*first <= today && !context.json()) {
+    context.note(format("what was recorded from day %s on may leave, before this moment too",
+                        dayText(*first)));
+  }
+}
+
+// The switch goes first: from then on nothing is filed or sent, and whatever ends this process, the
+// next run deletes the rest. Where there is no room to write the switch, deleting makes some.
+void deny(ToolContext& context) {
+  const SubmissionPermission none;
+  bool isStored = store(context, none);
+  const RemovedLogs removed = context.linuxPlatform().submission().removeWaiting();
+  isStored = isStored || store(context, none);
+  if (context.json()) {
+    context.printJson({{"submission_allowed", isStored ? Json(false) : Json(nullptr)},
+                       {"deleted_logs", removed.logs}});
+  } else {
+    context.out() << (isStored ? "submission is not allowed" : "submission may still be allowed")
+                  << "; " << counted(std::uint64_t{removed.logs}, "waiting log") << " deleted\n";
+  }
+  if (!isStored) {
+    context.fail("the withdrawal could not be written: mend what is said above and run it again");
+  }
+  if (removed.failure) {
+    context.fail(format("logs still wait: %s; nothing is sent, and the next run deletes them",
+                        removed.failure->message));
+  }
+}
+
+}  // namespace
+
+void addAllowCommand(Command app, ToolContext& context) {
+  const auto arguments = std::make_shared<AllowArguments>();
+  const Command command =
+      app.addCommand("allow", "Allow logs to leave the device, from the next whole day on");
+  command
+      .addOption("--from", arguments->from,
+                 "The first day whose statistics may leave: today, yesterday, a number or "
+                 "YYYY-MM-DD, UTC")
+      .typeName("DAY");
+  command.setFooter(
+      "Nothing that was recorded before leaves the device, unless --from names an earlier day. "
+      "See\n"
+      "docs/consent.md.");
+  context.addJsonOption(command);
+  command.onRun([&context, arguments] { allow(context, *arguments); });
+}
+
+void addDenyCommand(Command app, ToolContext& context) {
+  const Command command =
+      app.addCommand("deny", "Let no log leave the device, and delete those that wait");
+  context.addJsonOption(command);
+  command.onRun([&context] { deny(context); });
+}
+
+}  // namespace tavrel

@@ -1,0 +1,78 @@
+#include "tools/device/known_preferences.h"
+
+#include <algorithm>
+#include <array>
+
+#include "base/format.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+struct Form {
+  const char* text;     // "a boolean"
+  const char* example;  // of the end of a command line
+  bool (*fits)(const plist::Value& value);
+};
+
+bool isInteger(const plist::Value& value) {
+  const auto number = value.number();
+  return number && !number->isFloating();
+}
+
+bool isAmplification(const plist::Value& value) {
+  const auto number = value.number();
+  return number && number->real() > 0 && number->real() < 10;
+}
+
+constexpr Form kBoolean{"a boolean", "true --bool",
+                        [](const plist::Value& value) { return value.boolean().has_value(); }};
+constexpr Form kInteger{"an integer", "3 --int", isInteger};
+constexpr Form kString{"a string", "TEXT --string",
+                       [](const plist::Value& value) { return value.string().has_value(); }};
+constexpr Form kDate{"a date", "2026-11-27T18:02:18Z --date",
+                     [](const plist::Value& value) { return value.date().has_value(); }};
+constexpr Form kDictionary{"a dictionary", "@FILE --plist", [](const plist::Value& value) {
+                             return static_cast<bool>(value.dictionary());
+                           }};
+constexpr Form kAmplification{"a number above 0 and below 10", "2.5 --float", isAmplification};
+
+struct KnownPreference {
+  std::string_view domain;
+  std::string_view key;
+  const Form& form;
+};
+
+// Those of docs/files.md that have a name of their own.
+constexpr std::array kKnown = {
+    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionEnabled", kBoolean},
+    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kInteger},
+    KnownPreference{"com.norvane.zentrix", "com.norvane.zentrix.tallied.tavrel", kBoolean},
+    KnownPreference{"com.norvane.da", "AggressiveSubmissionDays", kInteger},
+    KnownPreference{"com.norvane.Drovelink", "ScheduledTasking", kDictionary},
+    KnownPreference{"com.norvane.tallied.tavrel", "LastCrashLogSerializationDateInDaysSince1970",
+                    kInteger},
+    KnownPreference{"com.norvane.tallied.tavrel", "LastLogOutcome", kString},
+    KnownPreference{"com.norvane.tallied.tavrel", "LastOSVersion", kString},
+    KnownPreference{"com.norvane.tallied.tavrel", "LastOSUpdate", kDictionary},
+    KnownPreference{"com.norvane.tallied", "DatabaseCorruptionCount", kInteger},
+    KnownPreference{"com.norvane.NANDInfo", "userWAmp", kAmplification},
+    KnownPreference{"com.norvane.zentrix.tavrel", "SSLastLoggedAt", kDate},
+    KnownPreference{"com.norvane.demo-settings", "StoreDemoMode", kBoolean},
+};
+
+}  // namespace
+
+std::string faultOfPreference(std::string_view domain, std::string_view key,
+                              const plist::Value& value) {
+  const auto* const known = std::find_if(
+      kKnown.begin(), kKnown.end(),
+      [&](const KnownPreference& entry) { return entry.domain == domain && entry.key == key; });
+  if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
+  return format(
+      "preference %s of domain %s is %s, and would be %s here: "
+      "'tavrelctl prefs set %s %s %s' has the right form; --force stores it as it is",
+      key, domain, known->form.text, inlineText(value), domain, key, known->form.example);
+}
+
+}  // namespace tavrel

@@ -1,0 +1,16 @@
+// The preferences that this system reads, with the form that each must have to count.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "base/plist.h"
+
+namespace tavrel {
+
+/// What is wrong with `value` as that preference, and the right form; empty when nothing is, or
+/// when the system does not know the preference. A null value removes it, which is always right.
+std::string faultOfPreference(std::string_view domain, std::string_view key,
+                              const plist::Value& value);
+
+}  // namespace tavrel
