@@ -15,26 +15,66 @@ using Place = FileSubmission::Place;
 
 const std::string kContent(10'000, 'L');
 
+constexpr std::int32_t kToday = 20784;  // of the fixed clock
+
+/// A store without rows.
+class DayStore final : public StatisticsStore {
+  struct NoRows final : BHHistory {
+    void scalarsForKeyPrefix(std::string_view, std::int64_t, std::int64_t,
+                             const ScalarRowHandler&) override {}
+    void distributionsForKeyPrefix(std::string_view, std::int64_t, std::int64_t,
+                                   const DistributionRowHandler&) override {}
+  };
+
+ public:
+  std::int32_t BHDaysSince1970() override { return kToday; }
+  plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
+  bool BHClientCheckpoint() override { return true; }
+  void BHClientSetValueForScalarKey(std::string_view, std::int64_t) override {}
+  std::unique_ptr<BHHistory> initWithDefaultPath() override { return std::make_unique<NoRows>(); }
+};
+
 struct Service : ProcessServices {
   Service(const DeviceRoot& root, FileSystem& fileSystem)
       : ProcessServices(root, fileSystem),
         version(root, fileSystem, coding, log),
-        submission(root, fileSystem, coding, preferences, version, clock, log) {}
+        submission(root, services(fileSystem)) {}
   explicit Service(const DeviceRoot& root)
       : ProcessServices(root),
         version(root, files, coding, log),
-        submission(root, files, coding, preferences, version, clock, log) {}
+        submission(root, services(files)) {}
 
+  FileSubmission::Services services(FileSystem& fileSystem) {
+    return {fileSystem, coding, preferences, preferences, days, version, clock, log};
+  }
+  void readRowsOf(std::int32_t day) {
+    days.initWithDefaultPath()->scalarsForKeyPrefix("", day - 1, day, {});
+  }
   bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
+    readRowsOf(kToday - 1);
+    return writeLog(name, options);
+  }
+  bool writeLog(std::string_view name, const plist::Dictionary& options = {}) {
     return submission.ZTXWriteLogForSubmission("193", name, options, [](LogFile& file) {
       file.write(asBytes(std::string_view(kContent).substr(0, 6000)));
       file.write(asBytes(std::string_view(kContent).substr(6000)));
     });
   }
 
+  DayStore store;
+  ReportedDays days{store};
   LinuxSystemVersion version;
   FileSubmission submission;
 };
+
+const std::string kFolder = "/var/mobile/Library/Logs/Submission/";
+const std::string kPermission = "/var/mobile/Library/Preferences/com.norvane.zentrix.plist";
+
+void permit(const TemporaryRoot& device, bool isGiven, const plist::Value& firstDay = {}) {
+  plist::Dictionary values{{"DiagnosticSubmissionEnabled", isGiven}};
+  values.set("DiagnosticSubmissionFirstDay", firstDay);
+  device.write(kPermission, *plist::PlistCoding().encodeXml(values));
+}
 
 std::ptrdiff_t filesPending(const TemporaryRoot& device) {
   std::error_code missing;
@@ -44,6 +84,7 @@ std::ptrdiff_t filesPending(const TemporaryRoot& device) {
 
 TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
   const TemporaryRoot device;
+  permit(device, true, kToday - 1);
   device.write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
   const std::string orphan = "/var/mobile/Library/Logs/Submission/pending/old.metadata.plist";
   device.write(orphan, "left by a process that was killed");
@@ -83,12 +124,13 @@ TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
     for (bool struck = true; struck; ++call) {
       SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
       const TemporaryRoot device;
+      permit(device, true);
       FaultyFileSystem faulty(device.root.path("/"), fault, call);
       Service service(device.root, faulty);
       const bool filed = service.file();
       if (!filed) {
         ASSERT_FALSE(service.log.lines.empty());
-        EXPECT_EQ(service.log.lines.back().find("cannot file log \"log-tallied\": cannot "), 0U);
+        EXPECT_EQ(service.log.lines.back().find("cannot file log \"log-tallied\": "), 0U);
         EXPECT_TRUE(!faulty.goesOn() || filesPending(device) == 0) << "nothing of it is left";
       }
       service.submission.submitDiagnosticLogs();
@@ -114,6 +156,114 @@ TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
       ASSERT_LT(call, 200);
     }
   }
+}
+
+TEST(Submission, FilesWhatTheOwnerPermits) {
+  constexpr std::int32_t kNoRows = -1;
+  const struct {
+    bool isGiven;
+    plist::Value firstDay;
+    std::int32_t day;  // whose rows the log is made of
+    const char* place;
+    bool mayReportYesterday;
+  } kCases[] = {
+      {false, {}, kNoRows, "withheld", false},
+      {false, {}, kToday - 1, "submission is not allowed", false},
+      {false, kToday - 9, kToday - 1, "submission is not allowed", false},
+      {true, {}, kNoRows, "pending", true},
+      {true, {}, kToday - 1, "pending", true},
+      {true, kToday - 1, kToday - 1, "pending", true},
+      {true, kToday, kToday - 1, "submission is allowed from day 20784 (2026-11-27) on", false},
+      {true, kToday, kToday, "pending", false},
+      {true, kToday - 1, kToday - 2, "submission is allowed from day 20783 (2026-11-26) on", true},
+      {true, kToday, kNoRows, "pending", false},
+      {true, kToday + 1, kNoRows, "withheld", false},
+      {true, "soon", kToday - 1, "submission is allowed from day 2147483647", false},
+  };
+  for (const auto& given : kCases) {
+    SCOPED_TRACE(testing::Message() << given.isGiven << given.day << given.place);
+    const TemporaryRoot device;
+    permit(device, given.isGiven, given.firstDay);
+    Service service(device.root);
+    EXPECT_EQ(service.submission.isDiagnosticSubmissionEnabled(), given.mayReportYesterday);
+    if (given.day != kNoRows) service.readRowsOf(given.day);
+    const std::string folder = device.root.path(kFolder + given.place);
+    if (!service.writeLog("X")) {
+      EXPECT_NE(service.log.lines.back().find(given.place), std::string::npos)
+          << service.log.lines.back();
+    } else {
+      EXPECT_EQ(std::distance(fs::directory_iterator(folder), {}), 2);
+    }
+  }
+}
+
+TEST(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
+  const TemporaryRoot device;
+  Service service(device.root);
+  for (int i = 0; i < 10; ++i) {
+    // At last the clock is lost.
+    service.clock.time = plist::Date::since1970(i < 9 ? 1'795'802'538 + i : 5);
+    ASSERT_TRUE(service.writeLog("S"));
+  }
+  const auto logs = *service.submission.logs(Place::Withheld);
+  ASSERT_EQ(logs.size(), 8U);
+  EXPECT_EQ(logs[0].name.substr(0, 18), "S-19700101T000005Z");
+  EXPECT_EQ(logs[1].name.substr(0, 18), "S-20261127T180220Z");
+  const std::string folder = device.root.path(kFolder + "withheld");
+  EXPECT_EQ(fs::status(folder).permissions(), fs::perms::owner_all);
+  for (const auto& entry : fs::directory_iterator(folder))
+    EXPECT_EQ(entry.status().permissions(), fs::perms::owner_read | fs::perms::owner_write);
+  EXPECT_EQ(std::distance(fs::directory_iterator(folder), {}), 16);
+}
+
+TEST(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
+  const TemporaryRoot device;
+  for (const char* file :
+       {"pending/a.log", "pending/a.metadata.plist", "pending/left.metadata.plist",
+        "pending/.tavrel-half.tmp", "outbox/a.log", "outbox/b.log", "outbox/b.metadata.plist"}) {
+    device.write(kFolder + file, "x");
+  }
+  device.write(kFolder + "pending/folder.log/foreign", "x");
+  device.write(kFolder + "pending/foreign.txt", "x");
+  fs::create_symlink(device.root.path(kFolder + "pending/foreign.txt"),
+                     device.root.path(kFolder + "pending/link.log"));
+  const auto files = [&] {
+    std::set<std::string> names;
+    for (const auto& entry : fs::recursive_directory_iterator(device.root.path(kFolder)))
+      if (!entry.is_directory()) names.insert(entry.path().filename());
+    return names;
+  };
+  const auto before = files();
+  const auto ask = [&] {
+    Service service(device.root);
+    EXPECT_FALSE(service.submission.isDiagnosticSubmissionEnabled());
+    service.submission.submitDiagnosticLogs();
+    return service.log.lines;
+  };
+  device.write(kPermission, "damaged");
+  ask();
+  permit(device, true, kToday + 1);
+  ask();
+  EXPECT_EQ(files(), before);
+
+  permit(device, false, kToday + 1);
+  EXPECT_EQ(ask(),
+            (std::vector<std::string>{"submission is not allowed: 3 waiting logs deleted",
+                                      "no log is sent on: submission is no longer allowed"}));
+  EXPECT_EQ(files(), (std::set<std::string>{"foreign", "foreign.txt"}));
+  EXPECT_EQ(contentOf(device.root.path(kPermission)).find("FirstDay"), std::string::npos);
+}
+
+TEST(Submission, FilesNothingWhenThePermissionGoesMeanwhile) {
+  const TemporaryRoot device;
+  permit(device, true);
+  Service service(device.root);
+  service.readRowsOf(kToday - 1);
+  EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission(
+      "193", "log-tallied", {}, [&](LogFile&) { permit(device, false); }));
+  EXPECT_EQ(service.log.lines.back(),
+            "cannot file log \"log-tallied\": submission is no longer allowed");
+  EXPECT_EQ(filesPending(device), 0);
 }
 
 }  // namespace

@@ -65,11 +65,15 @@ struct Device : TemporaryRoot {
     write("/sys/devices/system/edac/mc/mc0/ce_count", "0\n");
     LinuxPlatform linuxPlatform(root);
     Platform& platform = linuxPlatform.platform();
-    platform.preferences->ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
-                                                 "com.norvane.zentrix");
+    linuxPlatform.preferences().ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
+                                                       "com.norvane.zentrix");
     const Dictionary setting{{"Domain", "com.example"}, {"Key", "k"}, {"Value", 7}};
+    // Only the owner gives the permission, or takes it.
+    const Dictionary withdrawal{{"Domain", "com.norvane.zentrix"},
+                                {"Key", "DiagnosticSubmissionEnabled"}};
     platform.preferences->ZTXPreferencesSetValue(
-        kScheduledTaskingKey, Dictionary{{"TaskingID", "t"}, {"TaskingPayload", Array{setting}}},
+        kScheduledTaskingKey,
+        Dictionary{{"TaskingID", "t"}, {"TaskingPayload", Array{setting, withdrawal}}},
         kScheduleDomain);
     yesterday = platform.statistics->BHDaysSince1970() - 1;
     auto batch = linuxPlatform.store().beginBatch();

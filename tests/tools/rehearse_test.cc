@@ -91,9 +91,9 @@ Checkpoint of the statistics store
 
 Report
   reads preference com.norvane.zentrix DiagnosticSubmissionEnabled: true
+  reads preference com.norvane.zentrix DiagnosticSubmissionFirstDay: none
   asks the device InternalBuild: none
   reads file /Library/Application Support/Brimhold/Whitelist_Pellio.plist: 195 bytes
-  reads preference com.norvane.da G: none
   logs info: writing tallied log. yesterday=TODAY
   reads scalars of day TODAY: 1 row
   reads distributions of day TODAY: 0 rows

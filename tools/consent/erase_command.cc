@@ -175,6 +175,7 @@ void print(ToolContext& context, const Scope& scope, const Erased& erased) {
                               {"record_files", erased.recordFiles},
                               {"files_set_aside", erased.asideFiles},
                               {"logs", erased.logs},
+                              {"store_copied", rows.isCopied},
                               {"log_of_store_emptied", rows.isLogEmpty}});
   }
   const auto count = [](std::size_t number, std::string_view what) {
@@ -195,6 +196,12 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const ErasedRows& r
     context.fail(
         "another process uses the store: its write-ahead log still has what was erased: run it "
         "again when that process has ended");
+  }
+  if (!rows.isCopied) {
+    context.note(
+        "the store is too large to copy: parts of its pages without rows may still have single "
+        "keys "
+        "or values of what was erased");
   }
   if (scope.logs) return;
   if (rows.damaged > 0) {

@@ -69,10 +69,12 @@ std::string faultOfPreference(std::string_view domain, std::string_view key,
       kKnown.begin(), kKnown.end(),
       [&](const KnownPreference& entry) { return entry.domain == domain && entry.key == key; });
   if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
+  const bool isLong = value.dictionary() || value.array() || value.data();
   return format(
-      "preference %s of domain %s is %s, and would be %s here: "
-      "'tavrelctl prefs set %s %s %s' has the right form; --force stores it as it is",
-      key, domain, known->form.text, inlineText(value), domain, key, known->form.example);
+      "preference %s of domain %s is %s, not %s: give 'tavrelctl prefs set %s %s %s', or "
+      "store it all the same with --force",
+      key, domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value), domain,
+      key, known->form.example);
 }
 
 }  // namespace tavrel

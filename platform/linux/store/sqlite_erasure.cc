@@ -20,6 +20,9 @@ constexpr std::int64_t kPagesAtOnce = 256;
 
 constexpr off_t kLogBytes = 1 << 20;
 
+// The largest store that is copied; one process writes meanwhile, for a second or two.
+constexpr std::int64_t kCopiedBytes = 64 << 20;
+
 std::string statement(std::string_view before, std::string_view table, std::string_view after) {
   std::string sql(before);
   sql += table;
@@ -62,8 +65,8 @@ std::vector<std::string> nextKeys(SqliteConnection& connection, std::string_view
 
 StoreErasure::StoreErasure(SqliteConnection& connection, std::string storePath)
     : connection_(connection), path_(std::move(storePath)) {
-  // Of the pages that become free, too. A copy that SQLite makes of the rest is not on storage.
-  connection_.execute("PRAGMA secure_delete = ON; PRAGMA temp_store = MEMORY");
+  // Of the pages that become free, too.
+  connection_.execute("PRAGMA secure_delete = ON");
 }
 
 void StoreErasure::limitLog() {
@@ -169,9 +172,12 @@ void StoreErasure::eraseStrayChunks() {
   }
 }
 
-void StoreErasure::shrink() {
-  eraseStrayChunks();
+bool StoreErasure::copyPages() {
+  const std::int64_t used =
+      connection_.integer("PRAGMA page_count") - connection_.integer("PRAGMA freelist_count");
+  if (used > kCopiedBytes / connection_.integer("PRAGMA page_size")) return false;
   connection_.execute("VACUUM");
+  return true;
 }
 
 }  // namespace tavrel

@@ -34,6 +34,9 @@ struct ErasedRows {
   std::uint64_t values = 0;  // of those distributions
   /// Distributions whose rows do not say where their values are; those stay in the file.
   std::uint64_t damaged = 0;
+  /// Whether all pages were written again. Otherwise parts of pages that hold no row may still have
+  /// bytes of removed rows, from when SQLite moved these to other pages.
+  bool isCopied = true;
   /// Whether the write-ahead log, with what the pages held before, is gone.
   bool isLogEmpty = true;
 };
@@ -47,9 +50,11 @@ class StoreErasure {
   /// Overwrites the pages that are free now: they may hold what was removed earlier.
   void clearFreePages();
   ErasedRows eraseRows(const RowRange& range);
-  /// Removes values to which no row refers, and gives the free pages back to the file system. For a
-  /// store that has just been emptied: it copies what is left.
-  void shrink();
+  /// Removes values to which no row refers, when there are no rows.
+  void eraseStrayChunks();
+  /// Writes what is left into new pages and gives the others back to the file system. False, and
+  /// nothing is done, for a store that would keep other writers waiting for long.
+  bool copyPages();
   /// False while other processes need the log.
   bool emptyLog() { return connection_.checkpoint(); }
 
@@ -57,7 +62,6 @@ class StoreErasure {
   void eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased);
   void eraseKeys(std::string_view table, std::int64_t day, const std::vector<std::string>& keys,
                  ErasedRows& erased);
-  void eraseStrayChunks();
   void limitLog();
 
   SqliteConnection& connection_;

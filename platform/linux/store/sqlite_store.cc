@@ -162,7 +162,8 @@ Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
     StoreErasure erasure(connection, site_.path);
     erasure.clearFreePages();
     erased = erasure.eraseRows(range);
-    if (range == RowRange()) erasure.shrink();
+    if (range == RowRange()) erasure.eraseStrayChunks();
+    erased.isCopied = erasure.copyPages();
     erased.isLogEmpty = erasure.emptyLog();
   });
   if (failure) return Error{site_.describe(*failure)};

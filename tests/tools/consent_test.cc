@@ -1,0 +1,182 @@
+#include "base/civil_time.h"
+#include "device.h"
+#include "tests/system/killed_process.h"
+
+namespace tavrel {
+namespace {
+
+namespace fs = std::filesystem;
+
+const std::string kSwitch = "com.norvane.zentrix DiagnosticSubmissionEnabled";
+const std::string kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+
+struct Consent : testing::Test {
+  Consent() { today = device.json("status")["today"]["day"]; }
+
+  std::string text(std::int32_t day) const {
+    return format("%d (%s)", day, dateText(civilFromDays(day)));
+  }
+  std::string allowed(std::int32_t day) const { return "allowed from day " + text(day) + " on"; }
+  void fileLogs(std::initializer_list<const char*> names) const {
+    for (const char* name : names)
+      device.fileLog(name, "text", "{}");
+  }
+  /// Logs that can be seen, each of which must have its metadata.
+  std::size_t visibleLogs() const {
+    std::size_t count = 0;
+    for (const char* place : {"pending", "outbox"}) {
+      const std::string folder = device.path(kSubmission + place);
+      if (!fs::exists(folder)) continue;
+      for (const auto& entry : fs::directory_iterator(folder)) {
+        if (entry.path().extension() != ".log") continue;
+        ++count;
+        EXPECT_TRUE(fs::exists(fs::path(entry.path()).replace_extension(".metadata.plist")));
+      }
+    }
+    return count;
+  }
+  bool holds(std::string_view marker) const {
+    for (const auto& [path, content] : device.files())
+      if (content.find(marker) != std::string::npos) return true;
+    return false;
+  }
+
+  TemporaryDevice device;
+  std::int32_t today = 0;
+};
+
+TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
+  device.check("allow", prints("submission is " + allowed(today + 1) + "\n"));
+  device.check("allow", prints("submission is already " + allowed(today + 1) + "\n"));
+  device.check(format("allow --from %d", today + 9),
+               fails("submission is already " + allowed(today + 1) +
+                     ": a later day needs 'tavrelctl deny' first"));
+  const auto status = device.json("status");
+  EXPECT_EQ(status["submission_allowed"], true);
+  EXPECT_EQ(status["submission_first_day"]["day"], today + 1);
+  EXPECT_NE(device.run("status").out.find("no log for day " + text(today - 1) + ": submission is " +
+                                          allowed(today + 1)),
+            std::string::npos);
+  device.check("allow --from yesterday",
+               {0, "submission is " + allowed(today - 1) + "\n",
+                "tavrelctl: what was recorded from day " + text(today - 1) +
+                    " on may leave, before this moment too\n"});
+
+  // A clock that is behind what is recorded.
+  device.run("deny");
+  device.run("stat import", format("scalar\t%d\tk\t1\n", today + 5));
+  EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 6);
+  device.check(
+      "allow --from soon",
+      fails("not a day: soon: give today, yesterday, a 32-bit day number or YYYY-MM-DD", 2));
+  device.write("/var/mobile/Library/Preferences/com.norvane.zentrix.plist", "damaged");
+  EXPECT_EQ(device.run("allow").status, 1);
+  EXPECT_EQ(device.run("deny").status, 0);
+  EXPECT_EQ(device.json("prefs get " + kSwitch)["value"], false);
+}
+
+TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
+  device.run("allow");
+  device.run("prefs set " + kSwitch + " true --bool");
+  EXPECT_EQ(device.json("status")["submission_first_day"]["day"], today + 1) << "nothing changed";
+  device.run("prefs set " + kSwitch + " false --bool");
+  fileLogs({"pending/log-tallied-1"});
+  EXPECT_NE(device.run("allow").error.find("1 waiting log of an earlier permission deleted"),
+            std::string::npos);
+  device.run("prefs delete " + kSwitch);
+  device.run("prefs set " + kSwitch + " true --bool");
+  EXPECT_EQ(device.json("status")["submission_first_day"], nullptr);
+  device.check("allow", prints("submission is already allowed\n"));
+  for (const auto& [key, value, wrong, right] :
+       {std::array{kSwitch.c_str(), "yes", "a boolean, not \"yes\"", "true --bool"},
+        {"com.norvane.NANDInfo userWAmp", "10 --int", "a number above 0 and below 10, not 10",
+         "2.5 --float"},
+        {"com.norvane.da AggressiveSubmissionDays", "1.5 --float", "an integer, not 1.5",
+         "3 --int"}}) {
+    const std::string name = key;
+    const std::size_t space = name.find(' ');
+    const std::string set = "prefs set " + name + " " + value;
+    device.check(
+        set, fails("preference " + name.substr(space + 1) + " of domain " + name.substr(0, space) +
+                       " is " + wrong + ": give 'tavrelctl prefs set " + name + " " + right +
+                       "', or store it all the same with --force",
+                   2));
+    EXPECT_EQ(device.run(set + " --force").status, 0);
+  }
+}
+
+TEST_F(Consent, DeniesWhereverItIsKilled) {
+  std::size_t kills = 0;
+  for (std::size_t calls = 0;; calls += 3, ++kills) {
+    device.run("allow");
+    fileLogs({"pending/a", "pending/b", "outbox/a", "outbox/c"});
+    if (!runUntilSystemCall(calls, [&] { device.run("deny"); })) break;
+    const std::size_t left = visibleLogs();
+    EXPECT_TRUE(left == 4 || device.json("status")["submission_allowed"] == false) << calls;
+    device.run("deny");
+    EXPECT_EQ(visibleLogs(), 0U);
+  }
+  EXPECT_GT(kills, 10U);
+  device.check("deny", prints("submission is not allowed; 0 waiting logs deleted\n"));
+}
+
+TEST_F(Consent, ShowsWhatIsWithheld) {
+  fileLogs({"withheld/StorageStatus-1"});
+  EXPECT_NE(device.run("status").out.find("Withheld logs    1, never sent\n"), std::string::npos);
+  EXPECT_EQ(device.json("log list")["logs"][0]["place"], "withheld");
+  EXPECT_EQ(device.json("log show StorageStatus-1")["log"]["text"], "text");
+}
+
+TEST_F(Consent, ErasesWhereverItIsKilled) {
+  std::string rows;
+  for (int i = 0; i < 1500; ++i) {
+    rows += format("scalar\t%d\tapp.gone%d\t1\nscalar\t%d\tapp.kept%d\t1\n", i % 3, i, i % 3, i);
+    rows += format("value\t%d\tapp.gone\t5\t-1.5\nvalue\t%d\tapp.kept\t5\t2.5\n", i % 3, i % 3);
+  }
+  std::size_t kills = 0;
+  for (std::size_t calls = 100;; calls += 97, ++kills) {
+    fs::remove_all(device.path("/var/mobile/Library/Brimhold"));
+    device.run("stat import", rows);
+    const std::string before = device.run("stat export app.kept").out;
+    const bool killed =
+        runUntilSystemCall(calls, [&] { device.run("erase --key app.gone --yes"); });
+    const Outcome again = device.run("erase --key app.gone --yes");
+    EXPECT_EQ(again.status, 0) << again;
+    EXPECT_EQ(device.run("stat export").out, before) << calls;
+    EXPECT_FALSE(holds("app.gone")) << calls;
+    EXPECT_FALSE(holds(std::string("\0\0\0\0\0\0\xF8\xBF", 8))) << "-1.5 at " << calls;
+    EXPECT_EQ(fs::file_size(device.path(kStore + "-wal")), 0U);
+    if (!killed) break;
+  }
+  EXPECT_GT(kills, 3U);
+}
+
+TEST_F(Consent, ErasesDaysOrAll) {
+  device.run("stat import", "scalar\t20000\ta\t1\nscalar\t20001\ta\t1\nvalue\t20001\tb\t5\t0.5\n");
+  const std::string records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/176-2024-10-0";
+  device.write(records + "4.jsonl", "");
+  device.write(records + "5.jsonl", "");
+  fileLogs({"pending/a", "outbox/a", "withheld/b", "refused/c"});
+  device.write(kStore + ".corrupt-X", "x");
+  device.check("erase --key a", fails("nobody can be asked here: give --yes to erase", 2));
+  for (const char* wrong : {"", " --all --key a", " --all --from 1 --to 2"}) {
+    device.check(std::string("erase --yes") + wrong,
+                 fails("name what to erase: --all, or --key PREFIX, --from DAY and --to DAY", 2));
+  }
+  device.check("erase --yes --from 5 --to 4",
+               fails("no days: 5 (1970-01-06) is after 4 (1970-01-05)", 2));
+  device.check("erase --yes --from 20001 --to 20001",
+               {0, "erased: 1 scalar, 1 distribution of 1 value, 1 file of records\n",
+                "tavrelctl: 2 waiting logs may report what was erased: 'tavrelctl deny' deletes "
+                "them\n"});
+  EXPECT_TRUE(fs::exists(device.path(records + "4.jsonl")));
+  device.check("erase --yes --all", prints("erased: 1 scalar, 0 distributions of 0 values, 1 file "
+                                           "of records, 3 logs, 1 damaged file\n"));
+  for (const auto& [path, content] : device.files())
+    EXPECT_TRUE(path.find(".log") == std::string::npos && path.find("corrupt") == std::string::npos)
+        << path;
+  device.check("stat list", prints("no statistics\n"));
+}
+
+}  // namespace
+}  // namespace tavrel
