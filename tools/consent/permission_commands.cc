@@ -150,8 +150,8 @@ void deny(ToolContext& context) {
     context.fail("the withdrawal could not be written: mend what is said above and run it again");
   }
   if (removed.failure) {
-    context.fail(format("logs still wait: %s; nothing is sent, and the next run deletes them",
-                        removed.failure->message));
+    context.fail(format("logs still wait: %s%s", removed.failure->message,
+                        isStored ? "; nothing is sent, and the next run deletes them" : ""));
   }
 }
 
