@@ -318,7 +318,10 @@ Status FileSystem::writeAll(int descriptor, ByteSpan bytes, const std::string& p
 }
 
 Status FileSystem::syncFolderOf(const std::string& path) {
-  const std::string folder = folderOf(path);
+  return flushFolder(folderOf(path));
+}
+
+Status FileSystem::flushFolder(const std::string& folder) {
   const Descriptor descriptor(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
   if (!descriptor) return systemError("flush the folder", folder);
   // Some file systems have no flush for folders, and say so.

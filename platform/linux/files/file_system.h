@@ -120,6 +120,8 @@ class FileSystem {
   Status remove(const std::string& path);
   /// The same, but a failure does not matter: the next clean-up tries again.
   void discard(const std::string& path) { removeFile(path.c_str()); }
+  /// Makes durable what was added to a folder, removed from it and renamed in it.
+  Status flushFolder(const std::string& folder);
   /// Makes a folder and those above it.
   Status makeFolders(const std::string& path);
   /// The same; only its owner may use the folder itself, also when it exists already.

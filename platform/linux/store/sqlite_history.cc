@@ -7,6 +7,7 @@
 
 #include "base/text.h"
 #include "platform/linux/store/chunk_reader.h"
+#include "platform/linux/store/sqlite_trim.h"
 
 namespace tavrel {
 namespace {
@@ -271,6 +272,20 @@ Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
   });
   if (!read) return read.error();
   return span;
+}
+
+Expected<std::vector<std::int32_t>> SqliteHistory::days() {
+  std::vector<std::int32_t> days;
+  const Status read = attempt([&] { days = daysIn(store_->connection); });
+  if (!read) return read.error();
+  return days;
+}
+
+Expected<std::int64_t> SqliteHistory::bytesInUse() {
+  std::int64_t bytes = 0;
+  const Status read = attempt([&] { bytes = bytesInUseOf(store_->connection); });
+  if (!read) return read.error();
+  return bytes;
 }
 
 Expected<std::optional<std::string>> SqliteHistory::segmentPosition(std::uint32_t owner,

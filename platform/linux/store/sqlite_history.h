@@ -11,6 +11,7 @@
 #include <functional>
 #include <optional>
 #include <string_view>
+#include <vector>
 
 #include "base/expected.h"
 #include "platform/linux/store/sqlite_schema.h"
@@ -64,6 +65,10 @@ class SqliteHistory : public BHHistory {
   };
   /// The first and the last day in the store; nothing when the store is empty.
   Expected<std::optional<DaySpan>> daysHeld();
+  /// All days that have statistics, ascending. Costs two look-ups for each.
+  Expected<std::vector<std::int32_t>> days();
+  /// Bytes of the pages that hold something, without the log.
+  Expected<std::int64_t> bytesInUse();
 
   /// How far a segment was folded; nothing when unknown. Agrees with the values that were read
   /// since `beginSnapshot`.

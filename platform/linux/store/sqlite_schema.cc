@@ -15,8 +15,9 @@
 namespace tavrel {
 namespace {
 
-// For a new store, whatever the library was built with. A commit writes whole pages.
-constexpr const char* kPageSize = "PRAGMA page_size = 4096";
+// For a new store, whatever the library was built with. A commit writes whole pages. Pages that old
+// days leave behind can be given back a few at a time.
+constexpr const char* kPages = "PRAGMA page_size = 4096; PRAGMA auto_vacuum = INCREMENTAL";
 
 // Keys are blobs: they are compared byte by byte and may hold any byte.
 constexpr const char* kScalarsTable = R"(
@@ -191,7 +192,7 @@ SqliteConnection openStoreForWriting(const std::string& path,
     version = schemaVersion(connection);
     if (version == 0) {
       if (hasTables(connection)) refuseSchema(version);
-      connection.execute(kPageSize);
+      connection.execute(kPages);
       connection.execute("PRAGMA journal_mode = WAL; BEGIN IMMEDIATE");
       for (const char* statement :
            {kScalarsTable, kDistributionsTable, kChunksTable, kSegmentsTable, kSetVersion}) {

@@ -204,4 +204,13 @@ Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch() {
   return batch;
 }
 
+Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {
+  std::unique_ptr<SqliteTrim> trim;
+  const auto failure = attempt([&](const auto& identity) {
+    if (identity) trim = std::make_unique<SqliteTrim>(openForWriting(), site_);
+  });
+  if (failure) return Error{site_.describe(*failure)};
+  return trim;
+}
+
 }  // namespace tavrel

@@ -28,6 +28,7 @@
 #include "platform/linux/store/sqlite_erasure.h"
 #include "platform/linux/store/sqlite_history.h"
 #include "platform/linux/store/sqlite_site.h"
+#include "platform/linux/store/sqlite_trim.h"
 #include "platform/preferences.h"
 #include "platform/statistics_store.h"
 #include "platform/system_log.h"
@@ -59,6 +60,9 @@ class SqliteStore : public StatisticsStore {
 
   /// A transaction of many changes; the store is created when there is none.
   Expected<std::unique_ptr<SqliteBatch>> beginBatch();
+
+  /// To remove days; null when there is no store.
+  Expected<std::unique_ptr<SqliteTrim>> beginTrim();
 
   /// The history with its wider set of queries; without rows when there is no store yet.
   Expected<std::unique_ptr<SqliteHistory>> openHistory();

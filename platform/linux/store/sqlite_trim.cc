@@ -1,0 +1,258 @@
+#include "platform/linux/store/sqlite_trim.h"
+
+#include <algorithm>
+#include <functional>
+#include <iterator>
+#include <optional>
+#include <string>
+#include <sys/statvfs.h>
+#include <time.h>
+#include <utility>
+
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/store/sqlite_schema.h"
+
+namespace tavrel {
+namespace {
+
+// The work of one transaction, in rows of scalars: some milliseconds. A chunk has up to three
+// pages, which are freed one by one.
+constexpr std::int64_t kStepRows = 4096;
+constexpr std::int64_t kRowsPerChunk = 8;
+
+// Pages moved to holes at the front of the file in one transaction.
+constexpr std::int64_t kStepPages = 256;
+
+// Others look for the lock every five milliseconds.
+constexpr timespec kPause{0, 10'000'000};
+
+constexpr off_t kLogBytes = 1 << 20;
+
+// A conversion copies the store through memory into its log, and other writers wait meanwhile:
+// a second or two on slow flash.
+constexpr std::int64_t kConvertibleBytes = 16 << 20;
+
+// Copy, log and what others write meanwhile.
+constexpr std::int64_t kConversionRoom = 3;
+
+constexpr std::int64_t kNoVacuum = 0;
+
+}  // namespace
+
+// A distribution, and those of its runs that are still there.
+struct SqliteTrim::Row {
+  std::string key;
+  std::int64_t count;
+  std::vector<ChunkRun> runs;
+};
+
+std::vector<std::int32_t> daysIn(SqliteConnection& connection) {
+  std::vector<std::int32_t> days;
+  for (const char* table : {"scalars", "distributions"}) {
+    SqliteStatement next(connection, std::string("SELECT day FROM ") + table +
+                                         " WHERE day > ?1 ORDER BY day LIMIT 1");
+    std::vector<std::int32_t> found;
+    for (std::int64_t day = std::int64_t{INT32_MIN} - 1;;) {
+      next.bind(1, day);
+      if (!next.step()) break;
+      day = next.integer(0);
+      // Only a writer other than ours could have put a day beyond 32 bits there.
+      if (day > INT32_MAX) break;
+      found.push_back(static_cast<std::int32_t>(day));
+      next.reset();
+    }
+    next.reset();
+    std::vector<std::int32_t> merged;
+    std::set_union(days.begin(), days.end(), found.begin(), found.end(),
+                   std::back_inserter(merged));
+    days = std::move(merged);
+  }
+  return days;
+}
+
+std::int64_t bytesInUseOf(SqliteConnection& connection) {
+  return (connection.integer("PRAGMA page_count") - connection.integer("PRAGMA freelist_count")) *
+         connection.integer("PRAGMA page_size");
+}
+
+Expected<std::vector<std::int32_t>> SqliteTrim::days() {
+  try {
+    return daysIn(connection_);
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+}
+
+Expected<std::int64_t> SqliteTrim::bytesInUse() {
+  try {
+    return bytesInUseOf(connection_);
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+}
+
+// Runs `step`, each time in a transaction, until it yields false.
+Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::int64_t)>& step) {
+  while (true) {
+    try {
+      connection_.execute("BEGIN IMMEDIATE");
+      if (schemaVersion(connection_) == kFirstSchemaVersion) {
+        migrate(connection_);
+        continue;
+      }
+      const bool goesOn = step(budget);
+      connection_.execute("COMMIT");
+      limitLog();
+      if (!goesOn) return Done{};
+    } catch (const StoreFailure& failure) {
+      try {
+        connection_.execute("ROLLBACK");
+      } catch (const StoreFailure&) {
+        // SQLite has rolled back already.
+      }
+      if (failure.fault != StoreFault::Device || budget == 1) {
+        return Error{site_.describe(failure)};
+      }
+      // A small transaction may fit where a large one does not, the more so in an empty log.
+      budget = std::max<std::int64_t>(budget / 16, 1);
+      limitLog();
+    }
+    nanosleep(&kPause, nullptr);
+  }
+}
+
+Status SqliteTrim::removeDay(std::int32_t day) {
+  return inSteps(kStepRows, [&](std::int64_t budget) { return removeSome(day, budget); });
+}
+
+// False when the day has gone.
+bool SqliteTrim::removeSome(std::int32_t day, std::int64_t budget) {
+  const std::int64_t left = budget - removeScalars(day, budget);
+  return left <= 0 || removeDistributions(day, left) <= 0;
+}
+
+// Yields how many, at most `budget`.
+std::int64_t SqliteTrim::removeScalars(std::int32_t day, std::int64_t budget) {
+  // The key up to which so many rows go; nothing when there are no more than that.
+  SqliteStatement last(connection_,
+                       "SELECT key FROM scalars WHERE day = ?1 ORDER BY key LIMIT 1 OFFSET ?2");
+  last.bind(1, day);
+  last.bind(2, budget - 1);
+  if (last.step()) {
+    const std::string key(last.bytes(0));
+    last.reset();
+    SqliteStatement remove(connection_, "DELETE FROM scalars WHERE day = ?1 AND key <= ?2");
+    remove.bind(1, day);
+    remove.bind(2, std::string_view(key));
+    remove.run();
+    return budget;
+  }
+  last.reset();
+  SqliteStatement remove(connection_, "DELETE FROM scalars WHERE day = ?1");
+  remove.bind(1, day);
+  remove.run();
+  return connection_.integer("SELECT changes()");
+}
+
+// Yields what is left of the budget: 0 or less when there may be more of the day.
+std::int64_t SqliteTrim::removeDistributions(std::int32_t day, std::int64_t budget) {
+  std::vector<Row> rows;
+  {
+    SqliteStatement next(connection_,
+                         "SELECT key, count, runs FROM distributions WHERE day = ?1 ORDER BY key");
+    next.bind(1, day);
+    for (std::int64_t work = 0; work < budget && next.step(); ++work) {
+      Row& row = rows.emplace_back(std::string(next.bytes(0)), next.integer(1));
+      auto runs = unpackRuns(next.bytes(2));
+      // What a damaged row refers to may belong to another.
+      if (runs && valuesIn(*runs) == row.count) row.runs = *std::move(runs);
+      for (const ChunkRun& run : row.runs)
+        work += kRowsPerChunk * (run.end() - run.first);
+    }
+  }
+  for (Row& row : rows) {
+    if (budget <= 0 || !removeRow(day, row, budget)) return 0;
+  }
+  return budget;
+}
+
+// Removes as many runs as the budget allows, at least one, and the row with the last of them. False
+// when something of it is left.
+bool SqliteTrim::removeRow(std::int32_t day, Row& row, std::int64_t& budget) {
+  SqliteStatement removeChunks(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
+  while (!row.runs.empty() && budget > 0) {
+    const ChunkRun& run = row.runs.back();
+    removeChunks.bind(1, run.first);
+    removeChunks.bind(2, run.end());
+    removeChunks.run();
+    budget -= kRowsPerChunk * (run.end() - run.first);
+    row.count -= run.values;
+    row.runs.pop_back();
+  }
+  if (row.runs.empty()) {
+    SqliteStatement remove(connection_, "DELETE FROM distributions WHERE day = ?1 AND key = ?2");
+    remove.bind(1, day);
+    remove.bind(2, std::string_view(row.key));
+    remove.run();
+    --budget;
+    return true;
+  }
+  std::string packed;
+  for (const ChunkRun& run : row.runs)
+    appendRun(packed, run);
+  SqliteStatement shorten(
+      connection_, "UPDATE distributions SET count = ?3, runs = ?4 WHERE day = ?1 AND key = ?2");
+  shorten.bind(1, day);
+  shorten.bind(2, std::string_view(row.key));
+  shorten.bind(3, row.count);
+  shorten.bind(4, std::string_view(packed));
+  shorten.run();
+  return false;
+}
+
+bool SqliteTrim::canBeConverted(std::int64_t bytes) {
+  struct statvfs room {};
+  return bytes <= kConvertibleBytes && statvfs(site_.path.c_str(), &room) == 0 &&
+         static_cast<std::int64_t>(room.f_bavail) * static_cast<std::int64_t>(room.f_frsize) >=
+             kConversionRoom * bytes;
+}
+
+Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
+  try {
+    const std::int64_t pageBytes = connection_.integer("PRAGMA page_size");
+    const auto surplus = [&] {
+      return connection_.integer("PRAGMA freelist_count") - freeBytesKept / pageBytes;
+    };
+    if (surplus() <= 0) return Done{};
+    if (connection_.integer("PRAGMA auto_vacuum") == kNoVacuum) {
+      if (!canBeConverted(bytesInUseOf(connection_))) return Done{};
+      connection_.execute("PRAGMA temp_store = MEMORY; PRAGMA auto_vacuum = INCREMENTAL; VACUUM");
+      connection_.checkpoint(false);
+      return Done{};
+    }
+    const Status done = inSteps(kStepPages, [&](std::int64_t budget) {
+      const std::int64_t pages = std::min(surplus(), budget);
+      if (pages <= 0) return false;
+      connection_.execute(("PRAGMA incremental_vacuum(" + std::to_string(pages) + ")").c_str());
+      return pages == budget;
+    });
+    if (!done) return done;
+    // The file itself becomes shorter when the log is moved.
+    connection_.checkpoint(false);
+  } catch (const StoreFailure& failure) {
+    return Error{site_.describe(failure)};
+  }
+  return Done{};
+}
+
+// Readers may hold it up: the next step or the daily run moves it then.
+void SqliteTrim::limitLog() {
+  const auto log = FileSystem::status(site_.path + "-wal");
+  if (!log || log->st_size <= kLogBytes) return;
+  try {
+    connection_.checkpoint(false);
+  } catch (const StoreFailure&) {
+  }
+}
+
+}  // namespace tavrel

@@ -1,0 +1,68 @@
+// Removes whole days from the statistics store and gives their space back to the file system.
+//
+//   auto trim = store.beginTrim();
+//   if (!trim || !*trim) return;
+//   for (const std::int32_t day : *(*trim)->days()) (*trim)->removeDay(day);
+//   (*trim)->giveBack(reserve);
+//
+// Both work in small transactions with pauses between them, so that other writers wait for
+// milliseconds. Each transaction takes rows with their values: after a kill a day may be removed in
+// part, and the next trim goes on with it. The cost depends on what is removed and not on what
+// stays.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <utility>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/store/chunk_runs.h"
+#include "platform/linux/store/sqlite_connection.h"
+#include "platform/linux/store/sqlite_site.h"
+
+namespace tavrel {
+
+class SqliteTrim {
+ public:
+  SqliteTrim(SqliteConnection connection, const StoreSite& site)
+      : connection_(std::move(connection)), site_(site) {}
+
+  /// The days that have statistics, ascending. Costs two look-ups for each.
+  Expected<std::vector<std::int32_t>> days();
+
+  /// Bytes of the pages that hold something, without the log.
+  Expected<std::int64_t> bytesInUse();
+
+  /// Removes the scalars and distributions of a day. On a full disk the steps become smaller before
+  /// it fails.
+  Status removeDay(std::int32_t day);
+
+  /// Shortens the file until at most so many bytes of it are free. A store that was made without
+  /// the means for that is converted once, when it is small and the file system has room; a larger
+  /// one keeps its free pages for later values.
+  Status giveBack(std::int64_t freeBytesKept);
+
+ private:
+  struct Row;
+
+  Status inSteps(std::int64_t budget, const std::function<bool(std::int64_t budget)>& step);
+  bool removeSome(std::int32_t day, std::int64_t budget);
+  std::int64_t removeScalars(std::int32_t day, std::int64_t budget);
+  std::int64_t removeDistributions(std::int32_t day, std::int64_t budget);
+  bool removeRow(std::int32_t day, Row& row, std::int64_t& budget);
+  bool canBeConverted(std::int64_t bytes);
+  void limitLog();
+
+  SqliteConnection connection_;
+  StoreSite site_;
+};
+
+/// As `SqliteTrim::days`; throws `StoreFailure`.
+std::vector<std::int32_t> daysIn(SqliteConnection& connection);
+
+/// Throws `StoreFailure`.
+std::int64_t bytesInUseOf(SqliteConnection& connection);
+
+}  // namespace tavrel
