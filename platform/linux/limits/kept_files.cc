@@ -1,0 +1,218 @@
+#include "platform/linux/limits/kept_files.h"
+
+#include <algorithm>
+#include <set>
+
+#include "base/civil_time.h"
+#include "base/limits.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/logs/log_file_name.h"
+#include "platform/linux/logs/record_file_name.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kSubmissionFolder = "/var/mobile/Library/Logs/Submission/";
+constexpr std::string_view kEventFolder = "/var/lib/tavrel/ecc-events";
+constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold",
+                                                 "/var/mobile/Library/Preferences", kEventFolder};
+constexpr std::string_view kLogEnding = ".log";
+constexpr std::int64_t kBlockBytes = 4096;
+
+std::string_view folderOf(Kept kind) {
+  switch (kind) {
+    case Kept::Pending:
+      return "pending";
+    case Kept::Outbox:
+      return "outbox";
+    case Kept::Withheld:
+      return "withheld";
+    default:
+      return "refused";
+  }
+}
+
+std::int64_t blocksOf(const struct stat& status) {
+  return (status.st_size + kBlockBytes - 1) / kBlockBytes * kBlockBytes;
+}
+
+std::int64_t dayOfSecond(std::int64_t seconds) {
+  return (seconds - secondOfDay(seconds)) / kSecondsPerDay;
+}
+
+bool isSetAside(std::string_view name) {
+  return name.find(".corrupt-") != name.npos || name.ends_with("-kept-damaged") ||
+         name.ends_with(".unusable");
+}
+
+}  // namespace
+
+std::int64_t KeptFile::day() const {
+  return dayOfSecond(seconds);
+}
+
+Expected<KeptFiles> KeptFiles::list(Kept kind, const DeviceRoot& root, FileSystem& files,
+                                    std::int64_t today) {
+  KeptFiles kept(kind, files, today);
+  Status listed = Done{};
+  switch (kind) {
+    case Kept::Records:
+      kept.folder_ = root.path(kRecordFolder);
+      listed = kept.listRecords();
+      break;
+    case Kept::EccEvents:
+      kept.folder_ = root.path(kEventFolder);
+      listed = kept.listEvents();
+      break;
+    case Kept::SetAside:
+      for (const std::string_view folder : kSetAsideFolders) {
+        if (listed) listed = kept.listSetAside(root.path(folder));
+      }
+      break;
+    default:
+      kept.folder_ = root.path(std::string(kSubmissionFolder).append(folderOf(kind)));
+      listed = kept.listLogs();
+      break;
+  }
+  if (!listed) return listed.error();
+  std::ranges::sort(kept.list_, {}, [today](const KeptFile& file) {
+    return std::tuple(!isAhead(file.day(), today), file.seconds, std::string_view(file.path));
+  });
+  return kept;
+}
+
+// A file that is gone, or is none, does not count.
+void KeptFiles::add(const std::string& path, std::int64_t seconds) {
+  const auto status = FileSystem::status(path);
+  if (!status || !S_ISREG(status->st_mode)) return;
+  list_.push_back({path, {}, seconds, blocksOf(*status)});
+}
+
+Status KeptFiles::listLogs() {
+  const auto names = fileSystem_.list(folder_);
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
+    if (name.ends_with(kLogMetadataEnding)) {
+      std::string log = name.substr(0, name.size() - kLogMetadataEnding.size());
+      log += kLogEnding;
+      if (!std::ranges::binary_search(*names, log)) orphans_.push_back(folder_ + '/' + name);
+    }
+    if (!name.ends_with(kLogEnding)) continue;
+    const std::string stem = name.substr(0, name.size() - kLogEnding.size());
+    const std::string path = folder_ + '/' + name;
+    const auto status = FileSystem::status(path);
+    if (!status || !S_ISREG(status->st_mode)) continue;
+    const auto known = parseLogFileName(stem);
+    KeptFile& log = list_.emplace_back(
+        path, folder_ + '/' + stem, known ? known->seconds : std::int64_t{status->st_mtim.tv_sec},
+        blocksOf(*status));
+    log.companion += kLogMetadataEnding;
+    if (const auto metadata = FileSystem::status(log.companion)) log.bytes += blocksOf(*metadata);
+  }
+  return Done{};
+}
+
+Status KeptFiles::listRecords() {
+  const auto names = fileSystem_.list(folder_);
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
+    const auto file = parseRecordFileName(name);
+    if (file) add(folder_ + '/' + name, file->day * kSecondsPerDay);
+  }
+  return Done{};
+}
+
+// Events are taken in the order of their names, which is also their age.
+Status KeptFiles::listEvents() {
+  const auto names = fileSystem_.list(folder_);
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
+    if (name.ends_with(".event") || name.ends_with(".errno")) add(folder_ + '/' + name, 0);
+  }
+  return Done{};
+}
+
+Status KeptFiles::listSetAside(const std::string& folder) {
+  const auto names = fileSystem_.list(folder);
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
+    if (!isSetAside(name)) continue;
+    const auto status = FileSystem::status(folder + '/' + name);
+    if (status) add(folder + '/' + name, std::int64_t{status->st_mtim.tv_sec});
+  }
+  return Done{};
+}
+
+KeptUse KeptFiles::use() const {
+  KeptUse use;
+  std::set<std::int64_t> days;
+  for (const KeptFile& file : list_) {
+    ++use.items;
+    use.bytes += file.bytes;
+    days.insert(file.day());
+  }
+  use.days = static_cast<std::int64_t>(days.size());
+  return use;
+}
+
+bool KeptFiles::stays(std::size_t index) const {
+  switch (kind_) {
+    case Kept::EccEvents:
+    case Kept::SetAside:
+      return false;
+    case Kept::Records:
+      return list_[index].day() == today_;
+    default:
+      return index + 1 == list_.size();
+  }
+}
+
+TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
+  removeOrphans(now);
+  // Files of one day follow each other, so a day has gone when the next file is of another.
+  KeptUse left = use();
+  std::size_t count = 0;
+  while (count < list_.size() && (left.days > bounds.days || left.bytes > bounds.bytes) &&
+         !stays(count)) {
+    const KeptFile& file = list_[count];
+    left.bytes -= file.bytes;
+    if (++count == list_.size() || list_[count].day() != file.day()) --left.days;
+  }
+  if (count == 0) return {};
+  // A run that hands out events holds the same lock.
+  Expected<Descriptor> lock = Descriptor();
+  if (kind_ == Kept::EccEvents) lock = fileSystem_.lockFolder(folder_);
+  if (!lock) return {0, lock.error()};
+  return removeFirst(count);
+}
+
+// As long as a log can be seen, also after a power cut, its metadata can.
+TrimmedFiles KeptFiles::removeFirst(std::size_t count) {
+  TrimmedFiles trimmed;
+  std::size_t gone = 0;
+  while (gone < count && trimmed.status) {
+    trimmed.status = fileSystem_.remove(list_[gone].path);
+    if (trimmed.status) ++gone;
+  }
+  trimmed.removed = static_cast<std::int64_t>(gone);
+  if (gone == 0 || list_.front().companion.empty()) return trimmed;
+  if (Status flushed = fileSystem_.flushFolder(folder_); !flushed) {
+    trimmed.status = flushed;
+    return trimmed;
+  }
+  // One that cannot be removed now is removed as an orphan later.
+  for (std::size_t i = 0; i < gone; ++i)
+    fileSystem_.discard(list_[i].companion);
+  return trimmed;
+}
+
+void KeptFiles::removeOrphans(std::int64_t now) {
+  for (const std::string& path : orphans_) {
+    const auto status = FileSystem::status(path);
+    if (status && now - status->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
+      fileSystem_.discard(path);
+    }
+  }
+}
+
+}  // namespace tavrel

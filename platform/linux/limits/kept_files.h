@@ -1,0 +1,81 @@
+// Files that wait in the device's folders, and the removal of the oldest of them.
+//
+// No file is removed for its age, since the clock may be wrong: a device without a battery begins
+// in 1970, and a mistyped date may be years ahead. What counts is how many days have files, and how
+// many bytes they take. Of files that are too many, those dated after tomorrow go first, then the
+// oldest; so a clock that was wrong for a while costs what it left itself.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <tuple>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/limits/device_limits.h"
+
+namespace tavrel {
+
+/// True for a day that has not come: it was recorded while the clock was ahead.
+constexpr bool isAhead(std::int64_t day, std::int64_t today) {
+  return day > today + 1;
+}
+
+/// What is removed at once: a log with its metadata, or one file.
+struct KeptFile {
+  std::string path;
+  std::string companion;     // removed after it, once its removal has become durable; or empty
+  std::int64_t seconds = 0;  // since 1970, as its name says, otherwise as it was last changed
+  std::int64_t bytes = 0;    // of both, in whole blocks
+
+  std::int64_t day() const;
+};
+
+struct KeptUse {
+  std::int64_t items = 0;
+  std::int64_t days = 0;
+  std::int64_t bytes = 0;
+};
+
+struct TrimmedFiles {
+  std::int64_t removed = 0;
+  Status status = Done{};  // why not all went that should
+};
+
+class KeptFiles {
+ public:
+  /// `kind` is not the store. A missing folder has no files.
+  static Expected<KeptFiles> list(Kept kind, const DeviceRoot& root, FileSystem& files,
+                                  std::int64_t today);
+
+  KeptUse use() const;
+
+  /// Removes what exceeds the bounds. The newest log, and the records of `today`, always stay. Also
+  /// removes metadata that a killed process left without its log, when it was last changed more
+  /// than a day before `now`, in seconds since 1970.
+  TrimmedFiles trim(const Bounds& bounds, std::int64_t now);
+
+ private:
+  KeptFiles(Kept kind, FileSystem& files, std::int64_t today)
+      : kind_(kind), fileSystem_(files), today_(today) {}
+
+  Status listLogs();
+  Status listRecords();
+  Status listEvents();
+  Status listSetAside(const std::string& folder);
+  void add(const std::string& path, std::int64_t seconds);
+  bool stays(std::size_t index) const;
+  TrimmedFiles removeFirst(std::size_t count);
+  void removeOrphans(std::int64_t now);
+
+  Kept kind_;
+  FileSystem& fileSystem_;
+  std::int64_t today_;
+  std::string folder_;
+  std::vector<KeptFile> list_;  // the first to go first
+  std::vector<std::string> orphans_;
+};
+
+}  // namespace tavrel

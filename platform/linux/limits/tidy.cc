@@ -1,0 +1,153 @@
+#include "platform/linux/limits/tidy.h"
+
+#include <algorithm>
+
+#include "base/arithmetic.h"
+#include "platform/persisted_state.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::string_view kLockPath = "/run/tavrel/tidy.lock";
+
+// Free bytes that stay in the store's file, for the days to come: moving pages to shorten it by a
+// day's worth, only for the next day to lengthen it again, would wear the flash. Some two days, of
+// the bound at most this part.
+constexpr std::int64_t kReserveDays = 2;
+constexpr std::int64_t kLargestReservePart = 8;
+
+std::int64_t reserveOf(std::int64_t bytesInUse, std::int64_t days, const Bounds& bounds) {
+  return std::min(kReserveDays * bytesInUse / std::max<std::int64_t>(days, 1),
+                  bounds.bytes / kLargestReservePart);
+}
+
+}  // namespace
+
+TidyReport Tidy::run() {
+  TidyReport report;
+  const auto limits = DeviceLimits::read(root_, files_, propertyLists_);
+  if (!limits) {
+    report.failures.push_back(limits.error().message);
+    return report;
+  }
+  const auto lock = files_.lockFile(root_.path(kLockPath));
+  if (!lock) {
+    report.failures.push_back(lock.error().message);
+    return report;
+  }
+  const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
+  for (const KeptKind& kind : kKeptKinds) {
+    TidiedKind& tidied = report.kinds.emplace_back(&kind, limits->of(kind.kind));
+    if (kind.kind == Kept::Store) continue;
+    auto files = KeptFiles::list(kind.kind, root_, files_, store_.BHDaysSince1970());
+    if (!files) {
+      report.failures.push_back(files.error().message);
+      continue;
+    }
+    const TrimmedFiles trimmed = files->trim(tidied.bounds, now);
+    tidied.removed = trimmed.removed;
+    if (!trimmed.status) report.failures.push_back(trimmed.status.error().message);
+  }
+  TidiedKind& store = report.kinds[static_cast<std::size_t>(Kept::Store)];
+  trimStore(store.bounds, store, report.failures);
+  count(report, report.failures);
+  return report;
+}
+
+// Days that were recorded while the clock was ahead, then the oldest. Without the days that wait to
+// be reported: today, yesterday before its run, and the two after the last run, which they were
+// before a clock went wrong.
+std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& days) {
+  const std::int64_t today = store_.BHDaysSince1970();
+  bool hasRun = false;
+  const std::int64_t lastRun =
+      lowInt32(preferences_.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun));
+  std::vector<std::int32_t> order;
+  std::ranges::copy_if(days, std::back_inserter(order), [&](std::int32_t day) {
+    if (day == today || (hasRun && day <= lastRun)) return day != today;
+    const bool waits = day == today - 1 || (hasRun && day <= lastRun + 2);
+    return !waits;
+  });
+  std::ranges::stable_partition(order, [&](std::int32_t day) { return isAhead(day, today); });
+  return order;
+}
+
+void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::string>& failures) {
+  const auto fail = [&](const Error& error) { failures.push_back(error.message); };
+  auto trim = store_.beginTrim();
+  if (!trim) return fail(trim.error());
+  if (!*trim) return;
+  const auto days = (*trim)->days();
+  if (!days) return fail(days.error());
+  auto left = static_cast<std::int64_t>(days->size());
+  auto bytes = (*trim)->bytesInUse();
+  const auto exceeds = [&] { return left > bounds.days || (bytes && *bytes > bounds.bytes); };
+  for (const std::int32_t day : removalOrder(*days)) {
+    if (!bytes) return fail(bytes.error());
+    if (!exceeds()) break;
+    if (Status removed = (*trim)->removeDay(day); !removed) return fail(removed.error());
+    tidied.days.push_back(day);
+    ++tidied.removed;
+    --left;
+    bytes = (*trim)->bytesInUse();
+  }
+  if (!bytes) return fail(bytes.error());
+  tidied.exceeds = exceeds();
+  const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
+  if (!given) fail(given.error());
+}
+
+// The values are committed, or kept beside the store when there is no room.
+void Tidy::count(const TidyReport& report, std::vector<std::string>& failures) {
+  const std::int32_t today = store_.BHDaysSince1970();
+  bool hasCounted = false;
+  for (const TidiedKind& tidied : report.kinds) {
+    if (tidied.removed == 0) continue;
+    std::int64_t sum = tidied.removed;
+    if (const auto history = store_.openHistory(); history && (*history)->hasStore()) {
+      const Status read =
+          (*history)->walkScalar(tidied.kind->statistic, today, today,
+                                 [&](std::string_view, std::int32_t, std::int64_t value, bool&) {
+                                   sum = wrappingAdd(sum, value);
+                                 });
+      if (!read) failures.push_back(read.error().message);
+    }
+    store_.BHClientSetValueForScalarKey(tidied.kind->statistic, sum);
+    hasCounted = true;
+  }
+  if (hasCounted && !store_.commit()) failures.emplace_back("what was removed is not counted");
+}
+
+Expected<KeptUse> Tidy::measureStore() {
+  auto history = store_.openHistory();
+  if (!history) return history.error();
+  if (!(*history)->hasStore()) return KeptUse();
+  const auto days = (*history)->days();
+  const auto bytes = (*history)->bytesInUse();
+  if (!days) return days.error();
+  if (!bytes) return bytes.error();
+  const auto count = static_cast<std::int64_t>(days->size());
+  return KeptUse{count, count, *bytes};
+}
+
+Expected<std::vector<MeasuredKind>> Tidy::measure() {
+  const auto limits = DeviceLimits::read(root_, files_, propertyLists_);
+  if (!limits) return limits.error();
+  std::vector<MeasuredKind> measured;
+  for (const KeptKind& kind : kKeptKinds) {
+    KeptUse use;
+    if (kind.kind == Kept::Store) {
+      const auto store = measureStore();
+      if (!store) return store.error();
+      use = *store;
+    } else {
+      const auto files = KeptFiles::list(kind.kind, root_, files_, store_.BHDaysSince1970());
+      if (!files) return files.error();
+      use = files->use();
+    }
+    measured.push_back({&kind, limits->of(kind.kind), use});
+  }
+  return measured;
+}
+
+}  // namespace tavrel

@@ -1,0 +1,73 @@
+// Keeps the device's storage within its limits.
+//
+// Files go first, because removing them needs no room; on a full disk the store can then be
+// shortened too. What went is counted in statistics of the day.
+#pragma once
+
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "platform/clock.h"
+#include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/limits/device_limits.h"
+#include "platform/linux/limits/kept_files.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/preferences.h"
+#include "platform/property_list_coding.h"
+
+namespace tavrel {
+
+struct TidiedKind {
+  const KeptKind* kind;
+  Bounds bounds;
+  std::int64_t removed = 0;        // items
+  std::vector<std::int32_t> days;  // of the store, those that went
+  bool exceeds = false;            // what must stay takes more than the store's bounds
+};
+
+struct TidyReport {
+  std::vector<TidiedKind> kinds;      // all of them, in their order
+  std::vector<std::string> failures;  // a line each; the rest was done
+};
+
+struct MeasuredKind {
+  const KeptKind* kind;
+  Bounds bounds;
+  KeptUse use;  // of the store: items are days
+};
+
+class Tidy {
+ public:
+  /// All must outlive it.
+  Tidy(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists, Clock& clock,
+       Preferences& preferences, SqliteStore& store)
+      : root_(root),
+        files_(files),
+        propertyLists_(propertyLists),
+        clock_(clock),
+        preferences_(preferences),
+        store_(store) {}
+
+  /// Removes what exceeds the limits. While another process does so, waits for it.
+  TidyReport run();
+
+  /// What is held, beside its bounds. Changes nothing.
+  Expected<std::vector<MeasuredKind>> measure();
+
+ private:
+  void trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::string>& failures);
+  std::vector<std::int32_t> removalOrder(const std::vector<std::int32_t>& days);
+  Expected<KeptUse> measureStore();
+  void count(const TidyReport& report, std::vector<std::string>& failures);
+
+  const DeviceRoot& root_;
+  FileSystem& files_;
+  PropertyListCoding& propertyLists_;
+  Clock& clock_;
+  Preferences& preferences_;
+  SqliteStore& store_;
+};
+
+}  // namespace tavrel

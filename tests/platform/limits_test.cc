@@ -1,0 +1,294 @@
+// The limits of what a device holds, and what goes when they are exceeded.
+
+#include <numeric>
+#include <sqlite3.h>
+
+#include "device_services.h"
+#include "faulty_file_system.h"
+#include "platform/linux/limits/tidy.h"
+#include "platform/persisted_state.h"
+#include "platform/store_path.h"
+
+namespace tavrel {
+namespace {
+
+constexpr std::int32_t kToday = 20784;
+constexpr const char* kPending = "/var/mobile/Library/Logs/Submission/pending/";
+
+using Days = std::vector<std::int32_t>;
+
+class LimitsTest : public testing::Test, protected DeviceServices {
+ protected:
+  void limit(const plist::Dictionary& content) {
+    write("/etc/tavrel/limits.plist", *coding.encodeXml(content));
+  }
+  TidyReport tidy() { return Tidy(root, files, coding, clock, preferences, store).run(); }
+
+  /// A scalar and a distribution with so many values on each day.
+  void record(const Days& days, std::size_t values = 5) {
+    auto batch = store.beginBatch();
+    ASSERT_TRUE(batch) << batch.error().message;
+    for (const std::int32_t day : days) {
+      ASSERT_TRUE((*batch)->setScalar(day, "com.example.s", day));
+      const std::vector<DistributionSample> samples(values, {1.5, 7});
+      ASSERT_TRUE((*batch)->appendValues(day, "com.example.d", samples));
+    }
+    ASSERT_TRUE((*batch)->commit());
+  }
+  Days daysHeld() { return *(*store.openHistory())->days(); }
+  static Days range(std::int32_t first, std::int32_t last) {
+    Days days(static_cast<std::size_t>(last - first + 1));
+    std::iota(days.begin(), days.end(), first);
+    return days;
+  }
+  Lines sql(const std::string& text) {
+    sqlite3* handle = nullptr;
+    EXPECT_EQ(sqlite3_open(store.path().c_str(), &handle), SQLITE_OK);
+    Lines column;
+    const auto add = [](void* out, int count, char** values, char**) {
+      static_cast<Lines*>(out)->emplace_back(values[count - 1]);
+      return 0;
+    };
+    EXPECT_EQ(sqlite3_exec(handle, text.c_str(), add, &column, nullptr), SQLITE_OK) << text;
+    sqlite3_close(handle);
+    return column;
+  }
+  void setLastRun(std::int32_t day) {
+    preferences.ZTXPreferencesSetValue(kLastRunDayKey, day, kTavrelDomain);
+  }
+  std::int64_t statistic(std::string_view key) {
+    std::int64_t found = -1;
+    EXPECT_TRUE((*store.openHistory())
+                    ->walkScalar(key, kToday, kToday,
+                                 [&](auto, auto, std::int64_t value, bool&) { found = value; }));
+    return found;
+  }
+
+  SqliteStore store{root, clock, preferences, log};
+};
+
+TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
+  record(range(kToday - 200, kToday));
+  const std::pair<plist::Value, const char*> kCases[] = {
+      {plist::Dictionary{{"Stores", plist::Dictionary::create()}},
+       "\"Stores\" is not a limit; they are Store, Pending, Outbox, Withheld, Refused, Records, "
+       "EccEvents, SetAside"},
+      {plist::Dictionary{{"Store", 5}}, "Store must be a dictionary"},
+      {plist::Dictionary{{"Store", plist::Dictionary{{"Day", 5}}}},
+       "Store has no limit \"Day\"; it has Days and Bytes"},
+      {plist::Dictionary{{"SetAside", plist::Dictionary{{"Days", 5}}}},
+       "SetAside has no limit \"Days\"; it has Bytes"},
+      {plist::Dictionary{{"Store", plist::Dictionary{{"Days", 0}}}},
+       "Store/Days must be an integer from 1 to 36500"},
+      {plist::Dictionary{{"Store", plist::Dictionary{{"Days", 2.5}}}},
+       "Store/Days must be an integer from 1 to 36500"},
+      {plist::Dictionary{{"Outbox", plist::Dictionary{{"Bytes", 65535}}}},
+       "Outbox/Bytes must be an integer from 65536 to 1099511627776"},
+      {plist::Array{1}, "it is not a dictionary"}};
+  const std::string path = root.path("/etc/tavrel/limits.plist");
+  for (const auto& [content, fault] : kCases) {
+    write("/etc/tavrel/limits.plist", *coding.encodeXml(content));
+    EXPECT_EQ(tidy().failures,
+              Lines{path + ": " + fault + ": nothing is removed until it is repaired"});
+  }
+  limit(plist::Dictionary::create());
+  ASSERT_EQ(chmod(path.c_str(), 0666), 0);
+  EXPECT_EQ(tidy().failures,
+            Lines{path + ": others than root may write it; make root its owner, with mode 0644: "
+                         "nothing is removed until it is repaired"});
+  EXPECT_EQ(daysHeld().size(), 201U);
+}
+
+TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
+  limit({{"Store", plist::Dictionary{{"Days", 3}}}});
+  struct Case {
+    const char* what;
+    std::int32_t today;
+    std::optional<std::int32_t> lastRun;
+    Days held;
+    Days left;
+  };
+  const Case kCases[] = {
+      {"the oldest go", kToday, kToday - 1, range(kToday - 9, kToday), range(kToday - 2, kToday)},
+      {"yesterday waits for its run",
+       kToday,
+       kToday - 2,
+       {kToday - 9, kToday - 1, kToday, 5, 6},
+       {kToday - 9, kToday - 1, kToday}},
+      {"days of a clock that was ahead go before others",
+       kToday,
+       kToday - 1,
+       {kToday - 3, kToday - 2, kToday - 1, kToday, kToday + 2, kToday + 3650},
+       {kToday - 2, kToday - 1, kToday}},
+      {"tomorrow counts as today's neighbour",
+       kToday,
+       kToday - 1,
+       {kToday - 1, kToday, kToday + 1, kToday - 7},
+       range(kToday - 1, kToday + 1)},
+      {"a clock that jumps ahead costs one day a day",
+       kToday + 3650,
+       kToday + 3649,
+       {kToday - 2, kToday - 1, kToday, kToday + 3650},
+       {kToday - 1, kToday, kToday + 3650}},
+      {"a clock in 1970 keeps the day that the next run would have reported",
+       0,
+       kToday - 2,
+       {0, kToday - 3, kToday - 2, kToday - 1},
+       {0, kToday - 2, kToday - 1}},
+      {"nothing is due", kToday, std::nullopt, {kToday - 3000, kToday}, {kToday - 3000, kToday}}};
+  for (const Case& each : kCases) {
+    std::filesystem::remove_all(root.path("/var/mobile/Library/Brimhold"));
+    record(each.held);
+    clock.time = plist::Date::since1970(each.today * 86400.0 + 5);
+    preferences.ZTXPreferencesSetValue(
+        kLastRunDayKey, each.lastRun ? plist::Value(*each.lastRun) : plist::Value(), kTavrelDomain);
+    EXPECT_EQ(tidy().failures, Lines{}) << each.what;
+    // The count of what went is of today.
+    Days left = daysHeld();
+    EXPECT_EQ(left, each.left) << each.what;
+  }
+}
+
+TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
+  setLastRun(kToday - 1);
+  record(range(kToday - 99, kToday), 3000);
+  ASSERT_EQ(sql("PRAGMA auto_vacuum"), Lines{"2"});
+  limit({{"Store", plist::Dictionary{{"Bytes", 1 << 20}}}});
+  const TidyReport report = tidy();
+  EXPECT_EQ(report.failures, Lines{});
+  const Days left = daysHeld();
+  EXPECT_EQ(left.back(), kToday);
+  EXPECT_EQ(report.kinds[0].removed, 100 - static_cast<std::int64_t>(left.size()));
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.days"), report.kinds[0].removed);
+  EXPECT_GT(left.size(), 20U) << "no more than necessary";
+  EXPECT_LE(fs::file_size(store.path()), (1U << 20) + (1U << 17) + 8192);
+  // What is left is whole.
+  EXPECT_EQ(sql("PRAGMA integrity_check"), Lines{"ok"});
+  EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{std::to_string(left.size() * 6)});
+  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  tidy();
+  EXPECT_EQ(daysHeld(), Days{kToday});
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.days"), 99);
+}
+
+TEST_F(LimitsTest, KeepsDaysThatWaitWhateverTheirSize) {
+  record({kToday - 1, kToday}, 20'000);
+  limit({{"Store", plist::Dictionary{{"Days", 1}, {"Bytes", 65536}}}});
+  const TidyReport report = tidy();
+  EXPECT_TRUE(report.kinds[0].exceeds);
+  EXPECT_EQ(daysHeld(), (Days{kToday - 1, kToday}));
+}
+
+TEST_F(LimitsTest, ConvertsAStoreThatCannotShrinkOnce) {
+  setLastRun(kToday - 1);
+  record(range(kToday - 30, kToday), 3000);
+  sql("PRAGMA auto_vacuum = NONE; VACUUM");
+  sql("PRAGMA application_id = 77");
+  const auto before = fs::file_size(store.path());
+  limit({{"Store", plist::Dictionary{{"Days", 4}}}});
+  EXPECT_EQ(tidy().failures, Lines{});
+  EXPECT_EQ(sql("PRAGMA auto_vacuum"), Lines{"2"});
+  EXPECT_LT(fs::file_size(store.path()), before / 5);
+  EXPECT_EQ(sql("PRAGMA application_id"), Lines{"77"});
+  EXPECT_EQ(daysHeld(), range(kToday - 3, kToday));
+}
+
+TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
+  setLastRun(kToday - 1);
+  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  for (int commits = 0; commits < 3; ++commits)
+    record({kToday - 2}, 400'000);
+  record({kToday});
+  // A row that contradicts itself goes alone: its runs may be those of another.
+  sql("UPDATE distributions SET count = count + 1 WHERE day = " + std::to_string(kToday));
+  EXPECT_EQ(tidy().failures, Lines{});
+  EXPECT_EQ(daysHeld(), Days{kToday});
+  EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{"2"});
+}
+
+TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
+  const auto fileLog = [&](const std::string& name, std::size_t bytes) {
+    write(kPending + name + ".log", std::string(bytes, 'L'));
+    write(kPending + name + ".metadata.plist", "M");
+  };
+  fileLog("log-tallied-20261127T000000Z-00000001", 40'000);
+  fileLog("log-tallied-20261126T000000Z-00000002", 40'000);
+  fileLog("StorageStatus-20261125T000000Z-00000003", 40'000);
+  fileLog("log-tallied-20361127T000000Z-00000004", 40'000);
+  write(std::string(kPending) + "other.txt", std::string(99'999, 'x'));
+  const std::string records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
+  write(records + "176-2026-11-27.jsonl", std::string(90'000, 'r'));
+  write(records + "176-2026-11-26.jsonl", "r");
+  write("/var/lib/tavrel/ecc-events/b.event", std::string(60'000, 'e'));
+  write("/var/lib/tavrel/ecc-events/a.event", std::string(60'000, 'e'));
+  write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x", std::string(70'000, 'c'));
+  const plist::Dictionary small{{"Bytes", 65536}};
+  limit({{"Pending", plist::Dictionary{{"Bytes", 100'000}}},
+         {"Records", small},
+         {"EccEvents", small},
+         {"SetAside", small}});
+  const TidyReport report = tidy();
+  EXPECT_EQ(report.failures, Lines{});
+  std::vector<std::int64_t> removed;
+  for (const TidiedKind& kind : report.kinds)
+    removed.push_back(kind.removed);
+  EXPECT_EQ(removed, (std::vector<std::int64_t>{0, 2, 0, 0, 0, 1, 1, 1}));
+  EXPECT_EQ(*files.list(root.path(kPending)),
+            (Lines{"log-tallied-20261126T000000Z-00000002.log",
+                   "log-tallied-20261126T000000Z-00000002.metadata.plist",
+                   "log-tallied-20261127T000000Z-00000001.log",
+                   "log-tallied-20261127T000000Z-00000001.metadata.plist", "other.txt"}));
+  EXPECT_EQ(*files.list(root.path(records)), Lines{"176-2026-11-27.jsonl"});
+  EXPECT_EQ(*files.list(root.path("/var/lib/tavrel/ecc-events")), Lines{"b.event"});
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.pending.logs"), 2);
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.records.files"), 1);
+
+  // The newest log stays, however small the limit; days count as bytes do.
+  fileLog("log-tallied-20261127T000009Z-00000005", 400'000);
+  limit({{"Pending", plist::Dictionary{{"Days", 1}}}});
+  EXPECT_EQ(tidy().kinds[1].removed, 1);
+  limit({{"Pending", small}});
+  EXPECT_EQ(tidy().kinds[1].removed, 1);
+  EXPECT_EQ(files.list(root.path(kPending))->size(), 3U);
+}
+
+TEST(LimitsFaults, LogsHaveTheirMetadataAfterEveryFault) {
+  for (const auto fault : FaultyFileSystem::kFaults) {
+    int call = 1;
+    for (bool struck = true; struck; ++call) {
+      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
+      const TemporaryRoot device;
+      for (int log = 1; log <= 4; ++log) {
+        const std::string name = format("%slog-tallied-2026112%dT000000Z-00000000", kPending, log);
+        device.write(name + ".log", "L");
+        device.write(name + ".metadata.plist", "M");
+      }
+      FaultyFileSystem faulty(device.root.path("/"), fault, call);
+      ProcessServices process(device.root, faulty);
+      auto kept = KeptFiles::list(Kept::Pending, device.root, faulty, kToday);
+      ASSERT_TRUE(kept);
+      kept->trim({2, 1 << 20}, kToday * 86400LL);
+      struck = faulty.hasStruck();
+      faulty.settle();
+
+      const auto names = *process.files.list(device.root.path(kPending));
+      std::size_t logs = 0;
+      for (const std::string& name : names) {
+        if (!name.ends_with(".log")) continue;
+        ++logs;
+        EXPECT_TRUE(
+            std::ranges::binary_search(names, name.substr(0, name.size() - 4) + ".metadata.plist"))
+            << name;
+      }
+      EXPECT_GE(logs, 2U);
+      // What was left behind goes a day later.
+      auto later = KeptFiles::list(Kept::Pending, device.root, process.files, kToday);
+      later->trim({2, 1 << 20}, 4'000'000'000);
+      EXPECT_EQ(process.files.list(device.root.path(kPending))->size(), 4U);
+      ASSERT_LT(call, 50);
+    }
+  }
+}
+
+}  // namespace
+}  // namespace tavrel
