@@ -10,6 +10,7 @@
 #include "base/version.h"
 #include "tools/consent/erase_command.h"
 #include "tools/consent/permission_commands.h"
+#include "tools/device/limits_commands.h"
 #include "tools/device/prefs_commands.h"
 #include "tools/device/send_commands.h"
 #include "tools/device/status_command.h"
@@ -89,6 +90,8 @@ constexpr Subcommand kSubcommands[] = {
     {"plist", addPlistCommands},
     {"registry", addRegistryCommands},
     {"report", addReportCommands},
+    {"limits", addLimitsCommand},
+    {"tidy", addTidyCommand},
 };
 
 // The first argument that is neither an option nor the folder of --root; empty when there is none.

@@ -1,0 +1,115 @@
+#include "tools/device/limits_commands.h"
+
+#include <memory>
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "base/format.h"
+#include "platform/linux/limits/tidy.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/quantity_text.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+Tidy tidyOf(ToolContext& context, SqliteStore& store) {
+  LinuxPlatform& device = context.linuxPlatform();
+  Platform& platform = device.platform();
+  return {device.root(),  device.fileSystem(),   platform.propertyLists,
+          platform.clock, context.preferences(), store};
+}
+
+Json jsonOfDays(std::int64_t days) {
+  return days == kAnyDays ? Json(nullptr) : Json(days);
+}
+
+std::string ofBound(const std::string& held, const std::string& bound) {
+  return bound.empty() ? held : held + " of " + bound;
+}
+
+void showLimits(ToolContext& context) {
+  const auto measured = tidyOf(context, context.storeForReading()).measure();
+  if (!measured) return context.fail(measured.error().message);
+  Table table({{"WHAT", Table::Align::Whole},
+               {"DAYS", Table::Align::Right},
+               {"SIZE", Table::Align::Right},
+               {"ITEMS", Table::Align::Right}});
+  Json list = Json::array();
+  for (const auto& [kind, bounds, use] : *measured) {
+    list.push_back({{"name", kind->name},
+                    {"days", use.days},
+                    {"days_limit", jsonOfDays(bounds.days)},
+                    {"bytes", use.bytes},
+                    {"bytes_limit", bounds.bytes},
+                    {"items", use.items}});
+    const std::string days = bounds.days == kAnyDays ? "" : std::to_string(bounds.days);
+    table.add({std::string(kind->label), ofBound(std::to_string(use.days), days),
+               ofBound(sizeText(static_cast<double>(use.bytes)),
+                       sizeText(static_cast<double>(bounds.bytes))),
+               std::to_string(use.items)});
+  }
+  if (context.json()) return context.printJson({{"limits", std::move(list)}});
+  table.print(context.page());
+}
+
+std::string removalText(const TidiedKind& tidied) {
+  const auto removed = static_cast<std::uint64_t>(tidied.removed);
+  std::string text =
+      format("%s: %s removed", tidied.kind->label, counted(removed, tidied.kind->item));
+  if (!tidied.days.empty()) {
+    text += format(", %s", dayText(tidied.days.front()));
+    if (tidied.days.size() > 1) text += format(" to %s", dayText(tidied.days.back()));
+  }
+  return text;
+}
+
+void tidy(ToolContext& context, bool isQuiet) {
+  const TidyReport report = tidyOf(context, context.linuxPlatform().store()).run();
+  Json removals = Json::array();
+  for (const TidiedKind& tidied : report.kinds) {
+    if (tidied.removed > 0) {
+      Json days = Json::array();
+      for (const std::int32_t day : tidied.days)
+        days.push_back(day);
+      removals.push_back(
+          {{"name", tidied.kind->name}, {"removed", tidied.removed}, {"days", std::move(days)}});
+      if (!context.json()) context.out() << removalText(tidied) << '\n';
+    }
+    if (tidied.exceeds) {
+      context.note(
+          format("%s: what is left exceeds the limits and stays, because it has not been "
+                 "reported yet",
+                 tidied.kind->label));
+    }
+  }
+  if (context.json()) {
+    context.printJson({{"removals", removals}});
+  } else if (removals.empty() && report.failures.empty() && !isQuiet) {
+    context.out() << "nothing to remove\n";
+  }
+  for (const std::string& failure : report.failures)
+    context.fail(failure);
+}
+
+}  // namespace
+
+void addLimitsCommand(Command app, ToolContext& context) {
+  const Command command =
+      app.addCommand("limits", "Show what the device holds, beside its limits (docs/limits.md)");
+  context.addJsonOption(command);
+  command.onRun([&context] { showLimits(context); });
+}
+
+void addTidyCommand(Command app, ToolContext& context) {
+  const auto isQuiet = std::make_shared<bool>(false);
+  const Command command =
+      app.addCommand("tidy", "Remove what exceeds the limits, the oldest first");
+  command.addFlag("--quiet", *isQuiet, "Print nothing when nothing is removed");
+  context.addJsonOption(command);
+  command.onRun([&context, isQuiet] { tidy(context, *isQuiet); });
+}
+
+}  // namespace tavrel
