@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cmath>
+#include <functional>
 #include <tuple>
 
 #include "base/format.h"
@@ -54,6 +55,21 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
   return logs;
 }
 
+// The second in which a log was filed, as its name tells, otherwise its metadata.
+double secondFiled(ToolContext& context, FiledLog& log) {
+  if (const auto known = parseLogFileName(log.name)) return static_cast<double>(known->seconds);
+  context.linuxPlatform().submission().readMetadata(log);
+  return secondOf(log);
+}
+
+// Completes logs, leaves out what is no file, and sorts the rest.
+void readFacts(ToolContext& context, std::vector<FiledLog>& logs) {
+  std::erase_if(logs, [](FiledLog& log) { return !isRegular(log); });
+  for (FiledLog& log : logs)
+    context.linuxPlatform().submission().readMetadata(log);
+  std::stable_sort(logs.begin(), logs.end(), isOlder);
+}
+
 }  // namespace
 
 std::string_view nameOf(FileSubmission::Place place) {
@@ -65,13 +81,33 @@ std::string fileNameOf(const FiledLog& log) {
   return log.path.substr(log.path.rfind('/') + 1);
 }
 
-Expected<std::vector<FiledLog>> filedLogs(ToolContext& context) {
+Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
+  auto files = filesOfLogs(context);
+  if (!files) return files.error();
+  FiledLogs filed{*std::move(files), 0};
+  if (filed.logs.size() > most) {
+    // By the place of each, as a log is costly to move.
+    std::vector<std::pair<double, std::size_t>> seconds;
+    seconds.reserve(filed.logs.size());
+    for (FiledLog& log : filed.logs)
+      seconds.emplace_back(secondFiled(context, log), seconds.size());
+    const auto end = seconds.begin() + static_cast<std::ptrdiff_t>(most);
+    std::ranges::nth_element(seconds, end, std::greater<>());
+    std::vector<FiledLog> newest;
+    newest.reserve(most);
+    for (auto place = seconds.begin(); place != end; ++place)
+      newest.push_back(std::move(filed.logs[place->second]));
+    filed = {std::move(newest), filed.logs.size() - most};
+  }
+  readFacts(context, filed.logs);
+  return filed;
+}
+
+Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name) {
   auto logs = filesOfLogs(context);
   if (!logs) return logs;
-  std::erase_if(*logs, [](FiledLog& log) { return !isRegular(log); });
-  for (FiledLog& log : *logs)
-    context.linuxPlatform().submission().readMetadata(log);
-  std::stable_sort(logs->begin(), logs->end(), isOlder);
+  std::erase_if(*logs, [name](const FiledLog& log) { return !log.name.starts_with(name); });
+  readFacts(context, *logs);
   return logs;
 }
 

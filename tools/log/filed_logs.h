@@ -24,9 +24,17 @@ std::string_view nameOf(FileSubmission::Place place);
 /// The name of its file, with the ending.
 std::string fileNameOf(const FiledLog& log);
 
-/// The logs of all folders, oldest first. A line says so when those that are withheld cannot be
-/// seen.
-Expected<std::vector<FiledLog>> filedLogs(ToolContext& context);
+struct FiledLogs {
+  std::vector<FiledLog> logs;  // oldest first
+  std::size_t older = 0;       // that were left out
+};
+
+/// The newest logs of all folders, at most so many, chosen by the names of their files: only the
+/// metadata of those is read. A line says so when those that are withheld cannot be seen.
+Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
+
+/// The logs of all folders whose names begin so, oldest first.
+Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name);
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes. It is chosen by
 /// file names, so few metadata files are read. Nothing when there is none.

@@ -1,6 +1,7 @@
 #include "tools/log/log_commands.h"
 
 #include <algorithm>
+#include <limits>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -28,10 +29,14 @@
 namespace tavrel {
 namespace {
 
+// Each is read for the day that it reports.
+constexpr std::size_t kShownLogs = 100;
+
 struct Arguments {
   std::string file = "latest";
   std::string day;
   bool raw = false;
+  bool all = false;
   bool verbose = false;
 };
 
@@ -179,7 +184,10 @@ void addLogCommands(Command app, ToolContext& context) {
 
   const Command listCommand = group.addCommand("list", "List the logs that were submitted");
   context.addJsonOption(listCommand);
-  listCommand.onRun([&context] { listLogs(context); });
+  listCommand.addFlag("--all", arguments->all, "Show all; without it, the newest 100");
+  listCommand.onRun([&context, arguments] {
+    listLogs(context, arguments->all ? std::numeric_limits<std::size_t>::max() : kShownLogs);
+  });
 
   const Command showCommand = group.addCommand("show", "Show a submitted log");
   showCommand

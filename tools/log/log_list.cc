@@ -2,6 +2,7 @@
 
 #include <cmath>
 #include <nlohmann/json.hpp>
+#include <ostream>
 #include <set>
 
 #include "base/civil_time.h"
@@ -41,16 +42,16 @@ bool isSurelyForced(const FiledLog& log, std::optional<std::int32_t> day) {
 
 }  // namespace
 
-void listLogs(ToolContext& context) {
-  const auto logs = filedLogs(context);
-  if (!logs) return context.fail(logs.error().message);
+void listLogs(ToolContext& context, std::size_t most) {
+  const auto filed = filedLogs(context, most);
+  if (!filed) return context.fail(filed.error().message);
   Table table({{"DAY", Table::Align::Whole},
                {"RUN"},
                {"SIZE", Table::Align::Right},
                {"PLACE"},
                {"FILE", Table::Align::Whole}});
   Json entries = Json::array();
-  for (const FiledLog& log : *logs) {
+  for (const FiledLog& log : filed->logs) {
     const auto& status = log.status;
     const auto day = readDay(context, log);
     const bool isForced = isSurelyForced(log, day);
@@ -68,25 +69,27 @@ void listLogs(ToolContext& context) {
     }
   }
   if (context.json()) {
-    context.printJson({{"logs", std::move(entries)}});
+    context.printJson({{"logs", std::move(entries)}, {"older_logs", filed->older}});
   } else if (table.empty()) {
     context.out() << "no logs\n";
   } else {
     table.print(context.page());
   }
-  noteMissingMetadata(context, *logs);
+  if (filed->older > 0 && !context.json()) {
+    context.out() << counted(filed->older, "older log") << " not shown: see --all\n";
+  }
+  noteMissingMetadata(context, filed->logs);
 }
 
 Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name) {
   const LogEnvelope file{"file", name, {}};
   if (name == "-" || name.empty() || name.find('/') != std::string::npos) return file;
-  const auto logs = filedLogs(context);
+  const auto logs = filedLogsBeginning(context, name);
   if (!logs && !FileSystem::status(name)) return logs.error();
   if (!logs) return file;
   const FiledLog* found = nullptr;
   std::set<std::string_view> names;
   for (const FiledLog& log : *logs) {
-    if (!log.name.starts_with(name)) continue;
     found = &log;
     names.insert(log.name);
   }

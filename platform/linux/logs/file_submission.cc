@@ -197,7 +197,8 @@ void FileSubmission::removeOldMetadata(const std::string& folder,
   if (!fresh || !names) return;
   for (const std::string& file : *names) {
     const std::string name = withoutEnding(file, kLogMetadataEnding);
-    if (name.empty() || FileSystem::status(join(folder, name, kLogEnding))) continue;
+    const std::string log = std::string(name).append(kLogEnding);
+    if (name.empty() || std::ranges::binary_search(*names, log)) continue;
     const std::string path = join(folder, file, {});
     const auto found = FileSystem::status(path);
     if (found && fresh->st_mtim.tv_sec - found->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
