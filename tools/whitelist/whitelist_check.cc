@@ -9,7 +9,9 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/text.h"
+#include "config/bh_config.h"
 #include "tools/shared/value_text.h"
+#include "tools/whitelist/whitelist_coarseness.h"
 #include "tools/whitelist/whitelist_model.h"
 
 namespace tavrel {
@@ -17,9 +19,6 @@ namespace {
 
 constexpr std::string_view kTableNames =
     "ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes";
-
-// Bytes of one name in a finding's path; a file may repeat a name of a megabyte many times.
-constexpr std::size_t kShownNameBytes = 200;
 
 constexpr WhitelistTable kTables[] = {WhitelistTable::ScalarKeys, WhitelistTable::ScalarPrefixes,
                                       WhitelistTable::DistributionKeys,
@@ -34,11 +33,6 @@ std::optional<WhitelistTable> tableNamed(std::string_view name) {
     if (nameOf(table) == name) return table;
   }
   return std::nullopt;
-}
-
-std::string shownName(std::string_view name) {
-  if (name.size() <= kShownNameBytes) return std::string(name);
-  return std::string(name.substr(0, kShownNameBytes)) + "...";
 }
 
 /// The findings so far; from the limit on they are only counted.
@@ -75,6 +69,8 @@ class Checker {
     }
     for (const plist::Entry& group : whitelist.dictionary()) {
       const Place place(*this, group.key);
+      // What leaves internal devices only is meant to be exact.
+      isForAll_ = group.key != kInternalTestingGroup;
       checkGroup(group.value);
     }
   }
@@ -130,6 +126,14 @@ class Checker {
       }
       if (isPrefixTable(table) && rule.key.view().empty()) {
         add("is the empty prefix: every key begins with it");
+      }
+      if (isForAll_ && !isDistributionTable(table) &&
+          leavesScalarsUnchanged(rule.value.dictionary())) {
+        add("is let out unchanged: coarsen it with bucket_interval or sig_fig");
+      }
+      if (isForAll_ && table == WhitelistTable::DistributionPrefixes) {
+        add("lets out the exact minimum and maximum of every distribution that begins so: list "
+            "keys one by one");
       }
       for (const plist::Entry& option : rule.value.dictionary()) {
         const Place optionPlace(*this, option.key);
@@ -201,30 +205,24 @@ class Checker {
   }
 
   std::string path_;
+  bool isForAll_ = true;  // the group
   Findings& findings_;
 };
 
-/// The place of a rule, in the form that findings use.
-std::string pathOf(WhitelistTable table, const WhitelistRule& rule) {
-  return format("%s/%s/%s", shownName(rule.group), nameOf(table), shownName(rule.key));
-}
-
-void findRivals(WhitelistTable table, const std::vector<WhitelistRule>& rules, Findings& findings) {
+void findRivals(const std::vector<WhitelistRule>& rules, Findings& findings) {
   std::unordered_map<std::string_view, std::string_view> winners;
   for (const WhitelistRule& rule : rules)
     winners[rule.key] = rule.group;
   for (const WhitelistRule& rule : rules) {
     const std::string_view winner = winners[rule.key];
     if (winner == rule.group) continue;
-    findings.add(
-        pathOf(table, rule),
-        format("is listed by group %s too, which comes later and wins", shownName(winner)));
+    findings.add(pathOfRule(rule), format("is listed by group %s too, which comes later and wins",
+                                          shownName(winner)));
   }
 }
 
 // In sorted order a prefix directly follows those that it begins with; the stack holds them.
-void findHiddenPrefixes(WhitelistTable table, const std::vector<WhitelistRule>& rules,
-                        Findings& findings) {
+void findHiddenPrefixes(const std::vector<WhitelistRule>& rules, Findings& findings) {
   std::vector<const WhitelistRule*> sorted;
   sorted.reserve(rules.size());
   for (const WhitelistRule& rule : rules)
@@ -239,9 +237,9 @@ void findHiddenPrefixes(WhitelistTable table, const std::vector<WhitelistRule>& 
     if (!enclosing.empty() && enclosing.back()->key == rule->key) {
       enclosing.pop_back();  // a rival in another group, which has its finding
     } else if (!enclosing.empty()) {
-      findings.add(pathOf(table, *enclosing.back()),
+      findings.add(pathOfRule(*enclosing.back()),
                    format("is hidden by the longer prefix %s for keys that begin with that",
-                          pathOf(table, *rule)));
+                          pathOfRule(*rule)));
     }
     enclosing.push_back(rule);
   }
@@ -254,8 +252,8 @@ std::vector<WhitelistFinding> checkWhitelist(const plist::Value& whitelist) {
   Checker(findings).checkFile(whitelist);
   const WhitelistModel model(whitelist);
   for (const WhitelistTable table : kTables) {
-    findRivals(table, model.rules(table), findings);
-    if (isPrefixTable(table)) findHiddenPrefixes(table, model.rules(table), findings);
+    findRivals(model.rules(table), findings);
+    if (isPrefixTable(table)) findHiddenPrefixes(model.rules(table), findings);
   }
   return findings.take();
 }

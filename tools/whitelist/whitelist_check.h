@@ -14,9 +14,9 @@ struct WhitelistFinding {
   std::string message;
 };
 
-/// Everything that the daemon would ignore or that has a wrong type, then keys in several groups
-/// and prefixes that hide others. At most `limits::kWhitelistFindings`, and one that counts the
-/// rest.
+/// Everything that the daemon would ignore, that has a wrong type or that lets statistics out as
+/// they are, then keys in several groups and prefixes that hide others. At most
+/// `limits::kWhitelistFindings`, and one that counts the rest.
 std::vector<WhitelistFinding> checkWhitelist(const plist::Value& whitelist);
 
 }  // namespace tavrel

@@ -1,5 +1,7 @@
 #include "tools/whitelist/whitelist_commands.h"
 
+#include <algorithm>
+#include <iterator>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -14,6 +16,8 @@
 #include "tools/shared/input_file.h"
 #include "tools/shared/table.h"
 #include "tools/whitelist/whitelist_check.h"
+#include "tools/whitelist/whitelist_data.h"
+#include "tools/whitelist/whitelist_diff.h"
 #include "tools/whitelist/whitelist_explain.h"
 
 namespace tavrel {
@@ -21,6 +25,7 @@ namespace {
 
 struct Arguments {
   std::string file;  // empty for the device's own
+  std::string files[2];
   std::vector<std::string> keys;
   std::string value;
 };
@@ -44,7 +49,8 @@ Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file)
 void check(ToolContext& context, const Arguments& arguments) {
   const auto whitelist = readWhitelist(context, arguments.file);
   if (!whitelist) return context.fail(whitelist.error().message);
-  const auto findings = checkWhitelist(whitelist->value);
+  auto findings = checkWhitelist(whitelist->value);
+  std::ranges::move(checkAgainstData(context, whitelist->value), std::back_inserter(findings));
   if (!findings.empty()) context.setExitStatus(kExitFailure);
 
   std::string digest;
@@ -64,6 +70,26 @@ void check(ToolContext& context, const Arguments& arguments) {
   if (findings.empty()) {
     context.out() << printable(whitelist->name) << ": no findings (digest " << digest << ")\n";
   }
+}
+
+// As diff(1): 2 when the files could not be compared.
+void diff(ToolContext& context, const Arguments& arguments) {
+  std::vector<Whitelist> both;
+  for (const std::string& file : arguments.files) {
+    auto whitelist = readWhitelist(context, file);
+    if (!whitelist) return context.failUsage(whitelist.error().message);
+    if (!whitelist->value.dictionary()) {
+      return context.failUsage(
+          format("%s: it is no whitelist, which is a dictionary of groups", whitelist->name));
+    }
+    both.push_back(*std::move(whitelist));
+  }
+  const WhitelistChanges changes = compareWhitelists(both[0].value, both[1].value);
+  if (revealsMore(changes)) context.setExitStatus(kExitFailure);
+  if (!context.json()) return printChanges(context.out(), changes);
+  Json object = {{"old", both[0].name}, {"new", both[1].name}};
+  object.update(jsonOf(changes));
+  context.printJson(std::move(object));
 }
 
 void explain(ToolContext& context, const Arguments& arguments) {
@@ -93,11 +119,18 @@ void addWhitelistCommands(Command app, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
 
   const Command checkCommand = group.addCommand(
-      "check", "Report what the daemon would ignore; exit status 1 if there is anything");
+      "check", "Report what has no effect or coarsens nothing; exit status 1 if there is anything");
   checkCommand.addOption("FILE", arguments->file,
                          "Whitelist (default: the device's own); - is standard input");
   context.addJsonOption(checkCommand);
   checkCommand.onRun([&context, arguments] { check(context, *arguments); });
+
+  const Command diffCommand = group.addCommand(
+      "diff", "Compare what two whitelists let out; exit status 1 if NEW lets out more than OLD");
+  diffCommand.addOption("OLD", arguments->files[0], "Whitelist; - is standard input").required();
+  diffCommand.addOption("NEW", arguments->files[1], "Whitelist; - is standard input").required();
+  context.addJsonOption(diffCommand);
+  diffCommand.onRun([&context, arguments] { diff(context, *arguments); });
 
   const Command explainCommand =
       group.addCommand("explain", "Show which rule decides about a key, and its options");

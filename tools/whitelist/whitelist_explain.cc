@@ -15,6 +15,7 @@
 #include "tools/shared/table.h"
 #include "tools/shared/typed_value.h"
 #include "tools/shared/value_text.h"
+#include "tools/whitelist/whitelist_coarseness.h"
 
 namespace tavrel {
 namespace {
@@ -77,24 +78,6 @@ std::string ruleText(const KindExplanation& kind) {
       break;
   }
   return "not reported";
-}
-
-// The options that affect a kind of statistics.
-std::string optionsText(const plist::Dictionary& options, bool isScalar) {
-  std::string text;
-  const auto append = [&](std::string_view name) {
-    const auto value = options.get(name);
-    if (!value) return;
-    if (!text.empty()) text += ", ";
-    text += format("%s %s", name, inlineText(value));
-  };
-  if (isScalar) {
-    append(kBucketIntervalOption);
-    append(kSignificantFiguresOption);
-    return text.empty() ? "reported unchanged" : text;
-  }
-  append(kIntervalsOption);
-  return text.empty() ? "summary only" : "summary and histogram, " + text;
 }
 
 void printKind(std::ostream& out, const KindExplanation& kind, bool isScalar,

@@ -39,10 +39,16 @@ constexpr bool isDistributionTable(WhitelistTable table) {
 }
 
 struct WhitelistRule {
+  WhitelistTable table;
   std::string_view group;
   std::string_view key;  // or prefix
   plist::Dictionary options;
 };
+
+/// The place of a rule in the file, in the form of findings: "Group/ScalarKeys/key". Long names are
+/// cut.
+std::string pathOfRule(const WhitelistRule& rule);
+std::string shownName(std::string_view name);
 
 class WhitelistModel {
  public:

@@ -1,0 +1,88 @@
+#include "tools/whitelist/whitelist_coarseness.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <limits>
+#include <vector>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "config/bh_config.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+/// A 64-bit integer has at most 19 digits.
+constexpr std::int64_t kAllFigures = 19;
+
+std::uint32_t widthOf(const plist::Dictionary& options) {
+  const auto width = options.number(kBucketIntervalOption);
+  return std::max<std::uint32_t>(width ? width->uint32() : 1, 1);
+}
+
+// Counts of figures are subtracted in 32 bits: those near 2^32 drop more than any value has, and
+// leave 0.
+std::int64_t figuresOf(const plist::Dictionary& options) {
+  const auto figures = options.number(kSignificantFiguresOption);
+  if (!figures) return kAllFigures;
+  constexpr std::uint32_t kHalf = 1U << 31;
+  if (figures->uint32() > kHalf + kAllFigures) return -1;
+  return std::min<std::int64_t>(figures->uint32(), kAllFigures);
+}
+
+// Boundaries at which the histogram is divided; others never decide.
+std::vector<double> boundariesOf(const plist::Dictionary& options) {
+  std::vector<double> boundaries;
+  const plist::Array intervals = options.array(kIntervalsOption);
+  if (!intervals || intervals.size() > limits::kHistogramBoundaries) return boundaries;
+  for (const plist::Value& boundary : intervals) {
+    const auto number = boundary.number();
+    if (!number || std::isnan(number->real())) continue;
+    if (boundaries.empty() || number->real() > boundaries.back()) {
+      boundaries.push_back(number->real());
+    }
+  }
+  return boundaries;
+}
+
+}  // namespace
+
+Coarseness compareRounding(const plist::Dictionary& before, const plist::Dictionary& after) {
+  const std::uint32_t oldWidth = widthOf(before);
+  const std::uint32_t newWidth = widthOf(after);
+  const std::int64_t oldFigures = figuresOf(before);
+  const std::int64_t newFigures = figuresOf(after);
+  return {newWidth < oldWidth || newFigures > oldFigures,
+          newWidth > oldWidth || newFigures < oldFigures};
+}
+
+Coarseness compareIntervals(const plist::Dictionary& before, const plist::Dictionary& after) {
+  const std::vector<double> oldOnes = boundariesOf(before);
+  const std::vector<double> newOnes = boundariesOf(after);
+  return {!std::ranges::includes(oldOnes, newOnes), !std::ranges::includes(newOnes, oldOnes)};
+}
+
+bool leavesScalarsUnchanged(const plist::Dictionary& options) {
+  return widthOf(options) == 1 && figuresOf(options) == kAllFigures;
+}
+
+std::string optionsText(const plist::Dictionary& options, bool isScalar) {
+  std::string text;
+  const auto append = [&](std::string_view name) {
+    const auto value = options.get(name);
+    if (!value) return;
+    if (!text.empty()) text += ", ";
+    text += format("%s %s", name, inlineText(value));
+  };
+  if (isScalar) {
+    append(kBucketIntervalOption);
+    append(kSignificantFiguresOption);
+    return text.empty() ? "reported unchanged" : text;
+  }
+  append(kIntervalsOption);
+  return text.empty() ? "summary only" : "summary and histogram, " + text;
+}
+
+}  // namespace tavrel

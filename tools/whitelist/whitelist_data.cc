@@ -1,0 +1,120 @@
+#include "tools/whitelist/whitelist_data.h"
+
+#include <algorithm>
+#include <cmath>
+#include <optional>
+#include <span>
+
+#include "base/format.h"
+#include "base/limits.h"
+#include "config/bh_config.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "report/histogram.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+#include "tools/whitelist/whitelist_model.h"
+#include "tools/whitelist/whitelist_rules.h"
+
+namespace tavrel {
+namespace {
+
+// Minimum, maximum, mean, deviation and count are as many equations as four values have unknowns.
+constexpr std::int64_t kKnownFromSummary = 4;
+
+// With less than two values in a bucket on average, a histogram tells most values by themselves. In
+// few buckets that is chance.
+constexpr std::int64_t kFewBuckets = 8;
+
+/// Counts what one distribution would show.
+struct Shown {
+  std::int64_t values = 0;
+  std::int64_t notNumbers = 0;
+  std::int64_t buckets = 0;  // that hold something; 0 without a histogram
+
+  Shown(BHHistoryDistributionEnumerator& enumerator, const plist::Dictionary& options) {
+    const plist::Array intervals = options.array(kIntervalsOption);
+    auto histogram = intervals ? Histogram::create(intervals) : std::nullopt;
+    double value = 0;
+    std::uint32_t second = 0;
+    while (enumerator.getNextValue(value, second)) {
+      ++values;
+      notNumbers += std::isnan(value) ? 1 : 0;
+      if (histogram) histogram->count(value);
+    }
+    if (histogram) {
+      buckets =
+          std::ranges::count_if(histogram->counts(), [](std::uint32_t count) { return count > 0; });
+    }
+  }
+};
+
+class DataCheck {
+ public:
+  explicit DataCheck(const plist::Value& whitelist) : model_(whitelist), rules_(model_, true) {}
+
+  void look(std::string_view key, std::int32_t day, BHHistoryDistributionEnumerator& values) {
+    const WhitelistRule* const rule = rules_.ofKey(key);
+    if (rule == nullptr || findings.size() >= limits::kWhitelistFindings) return;
+    const Shown shown(values, rule->options);
+    const std::string which = format("%s on %s", key, dayDateText(day));
+    const std::string counts = counted(static_cast<std::uint64_t>(shown.values), "value");
+    if (shown.notNumbers > 0) {
+      add(*rule, format("%s: %lld of %s make mean and deviation nan, as they are not numbers: mend "
+                        "the program that records them",
+                        which, shown.notNumbers, counts));
+    }
+    if (shown.values > 0 && shown.values <= kKnownFromSummary) {
+      add(*rule,
+          format("%s: minimum, maximum, mean and deviation are exact and tell each of its %s",
+                 which, counts));
+    } else if (shown.buckets >= kFewBuckets && 2 * shown.buckets > shown.values) {
+      add(*rule, format("%s: intervals are finer than what is recorded: %s fill %lld buckets",
+                        which, counts, shown.buckets));
+    }
+  }
+
+  std::vector<WhitelistFinding> findings;
+
+ private:
+  void add(const WhitelistRule& rule, std::string message) {
+    findings.push_back({pathOfRule(rule), std::move(message)});
+  }
+
+  WhitelistModel model_;
+  WhitelistRules rules_;
+};
+
+// The last day that is over, otherwise the last one.
+std::optional<std::int32_t> dayToCheck(const std::vector<std::int32_t>& days, std::int32_t today) {
+  if (days.empty()) return std::nullopt;
+  const auto next = std::ranges::lower_bound(days, today);
+  return next == days.begin() ? *next : *std::prev(next);
+}
+
+}  // namespace
+
+std::vector<WhitelistFinding> checkAgainstData(ToolContext& context,
+                                               const plist::Value& whitelist) {
+  auto history = context.storeForReading().openHistory();
+  if (!history) {
+    context.note(history.error().message);
+    return {};
+  }
+  if (!(*history)->hasStore()) return {};
+  DataCheck check(whitelist);
+  const auto days = (*history)->days();
+  Status read = days ? Status(Done{}) : Status(days.error());
+  const auto day =
+      days ? dayToCheck(*days, context.storeForReading().BHDaysSince1970()) : std::nullopt;
+  if (day) {
+    read = (*history)->walkDistributions(
+        "", *day, *day,
+        [&](std::string_view key, std::int32_t of, std::int64_t,
+            BHHistoryDistributionEnumerator& values, bool&) { check.look(key, of, values); });
+  }
+  if (!read) context.note(read.error().message);
+  return std::move(check.findings);
+}
+
+}  // namespace tavrel
