@@ -28,6 +28,9 @@ LIMITS = {
     "live sample: CPU of one value, us": 6.0,
     "live sample: memory, MiB": 12.0,
     "upload: wall time, ratio to curl": 2.0,
+    "long history: tavrel -f, ratio to one day": 2.0,
+    "long history: status, ms": 100.0,
+    "long history: log list, ms": 100.0,
 }
 
 
