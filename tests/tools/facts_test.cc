@@ -119,6 +119,7 @@ void fill(const TemporaryDevice& device) {
   }
   device.write(kWhitelistFile, xmlOf(R"({"G": {"ScalarKeys": {"app.starts": {"sig_fig": 2, "x": 7}},
       "DistributionKeys": {"app.load": {"intervals": [20, 30]}}}})"));
+  device.write("/finer.plist", xmlOf(R"({"G": {"ScalarKeys": {"app.starts": {"sig_fig": 3}}}})"));
   device.run("stat import",
              "scalar\t20000\tapp.starts\t12345\nvalue\t20000\tapp.load\t1\t21.5\n"
              "value\t20000\tapp.load\t2\t35.25\n");
@@ -152,7 +153,10 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
   fill(device);
   const std::string buffers = TAVREL_EXAMPLES "/nand/";
   std::istringstream commands(
-      "status|log list|log show log-tallied|log show StorageStatus-2|whitelist check|"
+      "status|log list|log show log-tallied|log show StorageStatus-2|whitelist check|limits|"
+      "whitelist diff " +
+      device.path(kWhitelistFile) + " " + device.path("/finer.plist") +
+      "|"
       "whitelist explain app.starts app.load --value 123|stat list|stat show app.starts|"
       "stat show app.load|tasking show|nand info|nand info --all|nand parse " +
       buffers + "statistics.bin|nand parse " + buffers + "statistics.bin --diff " + buffers +
@@ -165,9 +169,9 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       "report sample --delta --interval 0|disks|disks --all");
   // Commands whose two outputs cannot be compared: each run differs (disk space, identifiers), a
   // run changes what the next one prints, or the text is a document of its own.
-  std::set<std::string> covered{"allow",       "deny",        "erase",
-                                "log preview", "notify post", "notify wait",
-                                "rehearse",    "stat fold",   "stat import"};
+  std::set<std::string> covered{"allow",       "deny",        "erase",    "log preview",
+                                "notify post", "notify wait", "rehearse", "stat fold",
+                                "stat import", "tidy"};
   for (std::string line; std::getline(commands, line, '|');) {
     const CommandLine command(line);
     const Outcome text = device.run(command);

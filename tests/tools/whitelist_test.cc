@@ -82,6 +82,91 @@ TEST(WhitelistCheck, ListsAThousandFindingsAndCountsTheRest) {
   EXPECT_TRUE(outcome.out.ends_with("standard input: has 234 more findings\n"));
 }
 
+TEST(WhitelistCheck, LooksAtTheDistributionsOfTheLastWholeDay) {
+  const TemporaryDevice device;
+  device.write(kWhitelistFile, xmlOf(R"({
+    "G": {"DistributionKeys": {"few": {}, "spoilt": {}, "fine": {"intervals":
+              [1, 2, 3, 4, 5, 6, 7, 8, 9]}, "coarse": {"intervals": [1, 2]}}},
+    "InternalTesting": {"DistributionKeyPrefixes": {"": {}}}})"));
+  device.check("whitelist check",
+               prints(device.path(kWhitelistFile) + ": no findings (digest "
+                                                    "2e83ddafab2e5b9f5ab6a8ed3b9fd72b)\n"));
+  std::string lines = "value\ttoday\tcoarse\t1\t1\n";
+  for (int i = 1; i <= 15; ++i) {
+    const std::string number = std::to_string(i);
+    for (const std::string key : {"few", "spoilt", "fine", "coarse", "unlisted"}) {
+      if (key == "few" && i > 4) continue;
+      const std::string value = key == "spoilt" && i == 7 ? "nan" : number;
+      lines += "value\t20000\t" + key + "\t" + number + "\t" + value + "\n";
+    }
+  }
+  device.run("stat import", lines);
+  device.check(
+      "whitelist check",
+      (Outcome{
+          1,
+          R"(G/DistributionKeys/few: few on 2024-10-04: minimum, maximum, mean and deviation are exact and tell each of its 4 values
+G/DistributionKeys/fine: fine on 2024-10-04: intervals are finer than what is recorded: 15 values fill 10 buckets
+G/DistributionKeys/spoilt: spoilt on 2024-10-04: 1 of 15 values make mean and deviation nan, as they are not numbers: mend the program that records them
+)",
+          ""}));
+}
+
+TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
+  const TemporaryDevice device;
+  const std::string before = device.path("/old.plist");
+  const std::string after = device.path("/new.plist");
+  device.write("/old.plist", xmlOf(R"({
+    "A": {"ScalarKeys": {"finer": {"sig_fig": 1}, "coarser": {}, "mixed": {"bucket_interval": 10},
+                         "same": {"bucket_interval": 1}, "gone": {}, "moved": {"sig_fig": 2},
+                         "all": {"sig_fig": 19}, "nothing": {"sig_fig": 4294967295}},
+          "ScalarKeyPrefixes": {"p.": {"sig_fig": 2}, "p.q.": {"sig_fig": 1}},
+          "DistributionKeys": {"more": {"intervals": [1, 3]}, "less": {"intervals": [1, 2, 0]},
+                               "empty": {"intervals": []}}},
+    "InternalTesting": {"ScalarKeys": {"secret": {}}}})"));
+  device.write("/new.plist", xmlOf(R"({
+    "A": {"ScalarKeys": {"finer": {"sig_fig": 2}, "coarser": {"bucket_interval": 2},
+                         "mixed": {"bucket_interval": 5, "sig_fig": 3},
+                         "same": {"sig_fig": 25}, "all": {}, "nothing": {"sig_fig": 0}},
+          "ScalarKeyPrefixes": {"p.": {"sig_fig": 2}, "": {"sig_fig": 2}},
+          "DistributionKeys": {"more": {"intervals": [1, 2, 3]}, "less": {"intervals": [2]},
+                               "empty": {}, "new": {}}}})"));
+  const std::string expected = R"(newly leaves (2)
+  scalars *: sig_fig 2
+  distribution new: summary only
+
+gets finer (5)
+  scalar finer: sig_fig 1 -> sig_fig 2
+  scalar mixed: bucket_interval 10 -> bucket_interval 5, sig_fig 3
+  scalar nothing: sig_fig 4294967295 -> sig_fig 0
+  scalars p.q.*: sig_fig 1 -> sig_fig 2
+  distribution more: summary and histogram, intervals [1, 3] -> summary and histogram, intervals [1, 2, 3]
+
+gets coarser (3)
+  scalar coarser: reported unchanged -> bucket_interval 2
+  scalar gone: reported unchanged -> sig_fig 2
+  distribution less: summary and histogram, intervals [1, 2, 0] -> summary and histogram, intervals [2]
+)";
+  device.check({"whitelist", "diff", before, after}, (Outcome{1, expected, ""}));
+  device.check({"whitelist", "diff", before, before}, prints("no change in what leaves\n"));
+  const auto json = device.json({"whitelist", "diff", after, before}, "", 1);
+  EXPECT_EQ(json["no_longer_leaves"], R"([
+      {"kind": "scalar", "prefix": "", "old": {"sig_fig": 2}, "new": null},
+      {"kind": "distribution", "key": "new", "old": {}, "new": null}])"_json);
+  EXPECT_EQ(json["finer"].size(), 4U);
+  EXPECT_EQ(json["newly_leaves"].size(), 0U);
+
+  // What only stops leaving or gets coarser needs no second look.
+  device.write("/none.plist", xmlOf("{}"));
+  EXPECT_EQ(device.run({"whitelist", "diff", before, device.path("/none.plist")}).status, 0);
+  const std::string absent = device.path("/absent");
+  device.check({"whitelist", "diff", before, absent},
+               fails("cannot read " + absent + ": No such file or directory", 2));
+  device.check({"whitelist", "diff", "-", after},
+               fails("standard input: it is no whitelist, which is a dictionary of groups", 2),
+               xmlOf("[]"));
+}
+
 TEST(WhitelistExplain, NamesTheRuleAndShowsWhatItDoes) {
   const TemporaryDevice device;
   device.write(kWhitelistFile, xmlOf(kGood));
