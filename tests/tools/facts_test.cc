@@ -119,6 +119,7 @@ void fill(const TemporaryDevice& device) {
   }
   device.write(kWhitelistFile, xmlOf(R"({"G": {"ScalarKeys": {"app.starts": {"sig_fig": 2, "x": 7}},
       "DistributionKeys": {"app.load": {"intervals": [20, 30]}}}})"));
+  device.write("/coarser.plist", xmlOf(R"({"G": {"ScalarKeys": {"app.starts": {"sig_fig": 2}}}})"));
   device.write("/finer.plist", xmlOf(R"({"G": {"ScalarKeys": {"app.starts": {"sig_fig": 3}}}})"));
   device.run("stat import",
              "scalar\t20000\tapp.starts\t12345\nvalue\t20000\tapp.load\t1\t21.5\n"
@@ -155,7 +156,7 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
   std::istringstream commands(
       "status|log list|log show log-tallied|log show StorageStatus-2|whitelist check|limits|"
       "whitelist diff " +
-      device.path(kWhitelistFile) + " " + device.path("/finer.plist") +
+      device.path("/coarser.plist") + " " + device.path("/finer.plist") +
       "|"
       "whitelist explain app.starts app.load --value 123|stat list|stat show app.starts|"
       "stat show app.load|tasking show|nand info|nand info --all|nand parse " +

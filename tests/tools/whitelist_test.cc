@@ -22,11 +22,13 @@ TEST(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
     "B": {"DistributionKeys": {"d": {"sig_fig": 1, "intervals": 3},
                                "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5]}},
       "ScalarKeyPrefixes": {"p.": {}, "p.q.": {}, "p.q.r": {}, "p.s": {}, "": {}},
-      "ScalarKeys": {"both": {"sig_fig": 1}}},
+      "DistributionKeyPrefixes": {"e.": {}},
+      "ScalarKeys": {"both": {"sig_fig": 1}, "mask": {"bucket_interval": 1}}},
     "C": {"ScalarKeys": {"both": {}}, "ScalarKeyPrefixes": {"p.": {}}},
     "D": true})"));
   const std::string expected =
       R"(A/DistributionKeys: is an array: a table is a dictionary from keys to options: ignored
+A/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
 A/ScalarKeys/number: is an integer: options are a dictionary, an empty one to report the value unchanged: ignored
 A/ScalarKeys/options/bucket_interval: is 0: a bucket has a width: the value is not bucketed
 A/ScalarKeys/options/intervals: does not affect scalars: ignored
@@ -35,6 +37,7 @@ A/ScalarKeys/options/sigfig: is not an option: ignored; the options are sig_fig,
 A/ScalarKeys/types/bucket_interval: is 2.5: expected an integer from 0 to 4294967295: used as 2
 A/ScalarKeys/types/sig_fig: is a string: expected an integer: ignored
 A/Scalars: is not a table of a group: ignored; the tables are ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes
+B/DistributionKeyPrefixes/e.: lets out the exact minimum and maximum of every distribution that begins so: list keys one by one
 B/DistributionKeys/d/intervals: is an integer: expected an array of numbers: no histogram is made
 B/DistributionKeys/d/sig_fig: does not affect distributions: ignored
 B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty
@@ -42,6 +45,13 @@ B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket sta
 B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty
 B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty
 B/ScalarKeyPrefixes/: is the empty prefix: every key begins with it
+B/ScalarKeyPrefixes/: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+B/ScalarKeyPrefixes/p.q.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+B/ScalarKeyPrefixes/p.q.r: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+B/ScalarKeyPrefixes/p.s: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+C/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+C/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
 D: is a boolean: a group is a dictionary of tables: ignored
 A/ScalarKeys/both: is listed by group C too, which comes later and wins
 B/ScalarKeys/both: is listed by group C too, which comes later and wins
@@ -87,10 +97,8 @@ TEST(WhitelistCheck, LooksAtTheDistributionsOfTheLastWholeDay) {
   device.write(kWhitelistFile, xmlOf(R"({
     "G": {"DistributionKeys": {"few": {}, "spoilt": {}, "fine": {"intervals":
               [1, 2, 3, 4, 5, 6, 7, 8, 9]}, "coarse": {"intervals": [1, 2]}}},
-    "InternalTesting": {"DistributionKeyPrefixes": {"": {}}}})"));
-  device.check("whitelist check",
-               prints(device.path(kWhitelistFile) + ": no findings (digest "
-                                                    "2e83ddafab2e5b9f5ab6a8ed3b9fd72b)\n"));
+    "InternalTesting": {"DistributionKeyPrefixes": {"u": {}}, "ScalarKeys": {"s": {}}}})"));
+  EXPECT_EQ(device.run("whitelist check").status, 0);
   std::string lines = "value\ttoday\tcoarse\t1\t1\n";
   for (int i = 1; i <= 15; ++i) {
     const std::string number = std::to_string(i);

@@ -127,9 +127,9 @@ class Checker {
       if (isPrefixTable(table) && rule.key.view().empty()) {
         add("is the empty prefix: every key begins with it");
       }
-      if (isForAll_ && !isDistributionTable(table) &&
-          leavesScalarsUnchanged(rule.value.dictionary())) {
-        add("is let out unchanged: coarsen it with bucket_interval or sig_fig");
+      if (isForAll_ && !isDistributionTable(table) && coarsensNoScalar(rule.value.dictionary())) {
+        add("is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is "
+            "meant");
       }
       if (isForAll_ && table == WhitelistTable::DistributionPrefixes) {
         add("lets out the exact minimum and maximum of every distribution that begins so: list "

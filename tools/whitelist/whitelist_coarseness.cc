@@ -64,8 +64,10 @@ Coarseness compareIntervals(const plist::Dictionary& before, const plist::Dictio
   return {!std::ranges::includes(oldOnes, newOnes), !std::ranges::includes(newOnes, oldOnes)};
 }
 
-bool leavesScalarsUnchanged(const plist::Dictionary& options) {
-  return widthOf(options) == 1 && figuresOf(options) == kAllFigures;
+bool coarsensNoScalar(const plist::Dictionary& options) {
+  const auto width = options.number(kBucketIntervalOption);
+  const bool isMeant = width && width->uint32() == 1;
+  return !isMeant && widthOf(options) == 1 && figuresOf(options) == kAllFigures;
 }
 
 std::string optionsText(const plist::Dictionary& options, bool isScalar) {

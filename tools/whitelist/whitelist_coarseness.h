@@ -19,8 +19,9 @@ Coarseness compareRounding(const plist::Dictionary& before, const plist::Diction
 /// Compares the histograms of distributions. A boundary that the earlier options lack is finer.
 Coarseness compareIntervals(const plist::Dictionary& before, const plist::Dictionary& after);
 
-/// Whether every scalar is reported as it is.
-bool leavesScalarsUnchanged(const plist::Dictionary& options);
+/// Whether every scalar is reported as it is, without a bucket width of 1 to say that this is
+/// meant.
+bool coarsensNoScalar(const plist::Dictionary& options);
 
 /// The options that affect a kind of statistics, for people.
 std::string optionsText(const plist::Dictionary& options, bool isScalar);

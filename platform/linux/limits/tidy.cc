@@ -8,8 +8,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kLockPath = "/run/tavrel/tidy.lock";
-
 // Free bytes that stay in the store's file, for the days to come: moving pages to shorten it by a
 // day's worth, only for the next day to lengthen it again, would wear the flash. Some two days, of
 // the bound at most this part.
@@ -30,7 +28,8 @@ TidyReport Tidy::run() {
     report.failures.push_back(limits.error().message);
     return report;
   }
-  const auto lock = files_.lockFile(root_.path(kLockPath));
+  // The root always exists, and locking it takes no room.
+  const auto lock = files_.lockFolder(root_.path("/"));
   if (!lock) {
     report.failures.push_back(lock.error().message);
     return report;

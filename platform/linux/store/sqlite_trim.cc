@@ -91,8 +91,10 @@ Expected<std::int64_t> SqliteTrim::bytesInUse() {
   }
 }
 
-// Runs `step`, each time in a transaction, until it yields false.
+// Runs `step`, each time in a transaction, until it yields false. On a full disk the log is
+// emptied, so that its room can be used again; when that does not help, the steps become smaller.
 Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::int64_t)>& step) {
+  bool hasAdvanced = false;  // since the log was emptied
   while (true) {
     try {
       connection_.execute("BEGIN IMMEDIATE");
@@ -102,7 +104,8 @@ Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::in
       }
       const bool goesOn = step(budget);
       connection_.execute("COMMIT");
-      limitLog();
+      hasAdvanced = true;
+      limitLog(kLogBytes);
       if (!goesOn) return Done{};
     } catch (const StoreFailure& failure) {
       try {
@@ -110,12 +113,11 @@ Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::in
       } catch (const StoreFailure&) {
         // SQLite has rolled back already.
       }
-      if (failure.fault != StoreFault::Device || budget == 1) {
-        return Error{site_.describe(failure)};
-      }
-      // A small transaction may fit where a large one does not, the more so in an empty log.
-      budget = std::max<std::int64_t>(budget / 16, 1);
-      limitLog();
+      const bool mayFit = failure.fault == StoreFault::Device && (hasAdvanced || budget > 1);
+      if (!mayFit) return Error{site_.describe(failure)};
+      if (!hasAdvanced) budget = std::max<std::int64_t>(budget / 16, 1);
+      hasAdvanced = false;
+      limitLog(0);
     }
     nanosleep(&kPause, nullptr);
   }
@@ -246,9 +248,9 @@ Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
 }
 
 // Readers may hold it up: the next step or the daily run moves it then.
-void SqliteTrim::limitLog() {
+void SqliteTrim::limitLog(off_t bytes) {
   const auto log = FileSystem::status(site_.path + "-wal");
-  if (!log || log->st_size <= kLogBytes) return;
+  if (!log || log->st_size <= bytes) return;
   try {
     connection_.checkpoint(false);
   } catch (const StoreFailure&) {

@@ -14,6 +14,7 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <sys/types.h>
 #include <utility>
 #include <vector>
 
@@ -35,8 +36,8 @@ class SqliteTrim {
   /// Bytes of the pages that hold something, without the log.
   Expected<std::int64_t> bytesInUse();
 
-  /// Removes the scalars and distributions of a day. On a full disk the steps become smaller before
-  /// it fails.
+  /// Removes the scalars and distributions of a day. On a full disk it makes do with little room
+  /// before it fails.
   Status removeDay(std::int32_t day);
 
   /// Shortens the file until at most so many bytes of it are free. A store that was made without
@@ -53,7 +54,7 @@ class SqliteTrim {
   std::int64_t removeDistributions(std::int32_t day, std::int64_t budget);
   bool removeRow(std::int32_t day, Row& row, std::int64_t& budget);
   bool canBeConverted(std::int64_t bytes);
-  void limitLog();
+  void limitLog(off_t bytes);
 
   SqliteConnection connection_;
   StoreSite site_;
