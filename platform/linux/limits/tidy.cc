@@ -84,14 +84,17 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   for (const std::int32_t day : removalOrder(*days)) {
     if (!bytes) return fail(bytes.error());
     if (!exceeds()) break;
-    if (Status removed = (*trim)->removeDay(day); !removed) return fail(removed.error());
+    if (Status removed = (*trim)->removeDay(day); !removed) {
+      fail(removed.error());
+      break;
+    }
     tidied.days.push_back(day);
     ++tidied.removed;
     --left;
     bytes = (*trim)->bytesInUse();
   }
   if (!bytes) return fail(bytes.error());
-  tidied.exceeds = exceeds();
+  tidied.exceeds = failures.empty() && exceeds();
   const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
   if (!given) fail(given.error());
 }
