@@ -164,7 +164,7 @@ Status FileSubmission::commit(NewFile& file, Place place, const std::string& nam
   const std::string metadataPath = join(folder(place), name, kLogMetadataEnding);
   Status done = files_.replace(metadataPath, asBytes(metadata), isWithheld ? kWithheldMode : kMode);
   if (done) {
-    removeOldMetadata(folder(place), metadataPath);
+    removeOldMetadata(place, metadataPath);
     done = file.commit();
   }
   if (!done) {
@@ -188,18 +188,38 @@ Status FileSubmission::checkPermission() const {
   return Done{};
 }
 
+// Without a list of names, which takes several times as long to make as to read.
+Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
+  const std::string path = folder(place);
+  const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir(path.c_str()), closedir);
+  Files files;
+  if (!open && errno == ENOENT) return files;
+  if (!open) return systemError("list", path);
+  errno = 0;
+  while (const dirent* entry = readdir(open.get())) {
+    const std::string_view name = entry->d_name;
+    if (name[0] == '.') continue;
+    files.logs += name.ends_with(kLogEnding) ? 1U : 0U;
+    files.metadata += name.ends_with(kLogMetadataEnding) ? 1U : 0U;
+  }
+  if (errno != 0) return systemError("list", path);
+  return files;
+}
+
 // Removes what a process left that was killed while filing a log. Ages are measured by the file
 // system's own clock, from the stamp of a file made just now.
-void FileSubmission::removeOldMetadata(const std::string& folder,
-                                       const std::string& freshMetadata) {
+void FileSubmission::removeOldMetadata(Place place, const std::string& freshMetadata) {
+  // Of the log that is being filed there is only the metadata yet.
+  const auto counts = countFiles(place);
+  if (!counts || counts->metadata <= counts->logs + 1) return;
   const auto fresh = FileSystem::status(freshMetadata);
-  const auto names = files_.list(folder);
+  const auto names = files_.list(folder(place));
   if (!fresh || !names) return;
   for (const std::string& file : *names) {
     const std::string name = withoutEnding(file, kLogMetadataEnding);
     const std::string log = std::string(name).append(kLogEnding);
     if (name.empty() || std::ranges::binary_search(*names, log)) continue;
-    const std::string path = join(folder, file, {});
+    const std::string path = join(folder(place), file, {});
     const auto found = FileSystem::status(path);
     if (found && fresh->st_mtim.tv_sec - found->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
       files_.discard(path);
@@ -266,20 +286,10 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::files(Place plac
   return logs;
 }
 
-// Without a list of names, which takes several times as long to make as to read.
 Expected<std::size_t> FileSubmission::count(Place place) const {
-  const std::string path = folder(place);
-  const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir(path.c_str()), closedir);
-  std::size_t count = 0;
-  if (!open && errno == ENOENT) return count;
-  if (!open) return systemError("list", path);
-  errno = 0;
-  while (const dirent* entry = readdir(open.get())) {
-    const std::string_view name = entry->d_name;
-    if (name[0] != '.' && name.ends_with(kLogEnding)) ++count;
-  }
-  if (errno != 0) return systemError("list", path);
-  return count;
+  const auto files = countFiles(place);
+  if (!files) return files.error();
+  return files->logs;
 }
 
 void FileSubmission::readMetadata(FiledLog& log) {

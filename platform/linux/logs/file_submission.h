@@ -104,14 +104,20 @@ class FileSubmission final : public SubmissionService {
   Expected<std::vector<FiledLog>> logs(Place place);
 
  private:
+  struct Files {
+    std::size_t logs = 0;
+    std::size_t metadata = 0;
+  };
+
   std::string folder(Place place) const;
   std::int32_t today() const;
+  Expected<Files> countFiles(Place place) const;
   Status fileLog(std::string_view logType, std::string_view logName,
                  const plist::Dictionary& options, const LogWriter& writer);
   /// Puts a written log in place, if it may still go there.
   Status commit(NewFile& file, Place place, const std::string& name, const std::string& metadata);
   Status moveToOutbox(const std::string& name);
-  void removeOldMetadata(const std::string& folder, const std::string& freshMetadata);
+  void removeOldMetadata(Place place, const std::string& freshMetadata);
   /// An error when storage does not have the owner's permission.
   Status checkPermission() const;
   RemovedLogs removeLogs(const std::vector<std::string>& folders, bool onlyWithoutPermission);
