@@ -271,10 +271,6 @@ Status FileSystem::makePrivateFolder(const std::string& path) {
   return Done{};
 }
 
-Status FileSystem::flushFolder(const std::string& folder) {
-  return status(folder) ? syncFolderOf(folder + "/.") : Done{};
-}
-
 Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, 0600);
   if (!descriptor) return descriptor;
@@ -323,6 +319,7 @@ Status FileSystem::syncFolderOf(const std::string& path) {
 
 Status FileSystem::flushFolder(const std::string& folder) {
   const Descriptor descriptor(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
+  if (!descriptor && errno == ENOENT) return Done{};
   if (!descriptor) return systemError("flush the folder", folder);
   // Some file systems have no flush for folders, and say so.
   if (syncFile(descriptor.get()) != 0 && errno != EINVAL) {

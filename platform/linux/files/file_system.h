@@ -120,13 +120,12 @@ class FileSystem {
   Status remove(const std::string& path);
   /// The same, but a failure does not matter: the next clean-up tries again.
   void discard(const std::string& path) { removeFile(path.c_str()); }
-  /// Makes durable what was added to a folder, removed from it and renamed in it.
-  Status flushFolder(const std::string& folder);
   /// Makes a folder and those above it.
   Status makeFolders(const std::string& path);
   /// The same; only its owner may use the folder itself, also when it exists already.
   Status makePrivateFolder(const std::string& path);
-  /// Makes the removals in a folder durable; a missing folder has none.
+  /// Makes durable what was added to a folder, removed from it and renamed in it; nothing for a
+  /// missing one.
   Status flushFolder(const std::string& folder);
   /// Removes the temporary files of a folder, also those that a process is writing: it can then no
   /// longer commit them.

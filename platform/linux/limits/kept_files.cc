@@ -16,7 +16,6 @@ constexpr std::string_view kSubmissionFolder = "/var/mobile/Library/Logs/Submiss
 constexpr std::string_view kEventFolder = "/var/lib/tavrel/ecc-events";
 constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold",
                                                  "/var/mobile/Library/Preferences", kEventFolder};
-constexpr std::string_view kLogEnding = ".log";
 constexpr std::int64_t kBlockBytes = 4096;
 
 std::string_view folderOf(Kept kind) {

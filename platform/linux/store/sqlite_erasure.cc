@@ -131,10 +131,10 @@ void StoreErasure::eraseKeys(std::string_view table, std::int64_t day,
         // Another process may have removed it since.
         const bool isThere = row.step();
         const auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
-        sum.distributions += isThere ? 1 : 0;
+        sum.distributions += isThere ? 1U : 0U;
         sum.values +=
             isThere ? static_cast<std::uint64_t>(std::max<std::int64_t>(row.integer(0), 0)) : 0;
-        sum.damaged += isThere && !runs ? 1 : 0;
+        sum.damaged += isThere && !runs ? 1U : 0U;
         row.reset();
         for (const ChunkRun& run : runs.value_or(std::vector<ChunkRun>())) {
           removeChunks.bind(1, run.first);
