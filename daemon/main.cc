@@ -3,11 +3,14 @@
 #include <exception>
 #include <fcntl.h>
 #include <span>
+#include <string_view>
 #include <unistd.h>
 #include <utility>
 
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/process/linux_clock.h"
+#include "platform/linux/runs/run_memory.h"
 #include "platform/linux/system_log/linux_system_log.h"
 
 namespace {
@@ -20,6 +23,13 @@ void secureStandardStreams() {
   while (descriptor >= 0 && descriptor <= STDERR_FILENO)
     descriptor = open("/dev/null", O_RDWR);
   if (descriptor >= 0) close(descriptor);
+}
+
+std::string_view taskOf(int argc, char** argv) {
+  const std::string_view mode = argc > 1 ? argv[1] : "";
+  if (mode == "-f") return "forced";
+  if (mode == "-t") return "today";
+  return mode.empty() ? "service" : "daily";
 }
 
 }  // namespace
@@ -35,9 +45,18 @@ int main(int argc, char** argv) {
                            usable.error().message);
       return 0;
     }
-    LinuxPlatform linuxPlatform(std::move(root));
-    return runTavrel(linuxPlatform.platform(),
-                     std::span<const char* const>(argv, static_cast<std::size_t>(argc)));
+    LinuxSystemLog systemLog;
+    LinuxClock clock;
+    RunMemory memory(root, clock, systemLog, taskOf(argc, argv));
+    try {
+      // Its end writes what the run has changed, which may fail like everything else.
+      LinuxPlatform linuxPlatform(std::move(root), {.log = &memory});
+      runTavrel(linuxPlatform.platform(),
+                std::span<const char* const>(argv, static_cast<std::size_t>(argc)));
+    } catch (const std::exception& error) {
+      memory.log(LogLevel::Error, "run ended early: %s", error.what());
+    }
+    memory.finish();
   } catch (const std::exception& error) {
     LinuxSystemLog().log(LogLevel::Error, "run ended early: %s", error.what());
   }

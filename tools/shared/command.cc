@@ -82,6 +82,10 @@ void Command::setFooter(std::string text) const {
   app_->footer(std::move(text));
 }
 
+void Command::hide() const {
+  app_->group("");
+}
+
 void Command::onRun(std::function<void()> action) const {
   app_->callback(std::move(action));
 }

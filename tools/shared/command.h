@@ -1,4 +1,5 @@
-// Subcommands and their options, over CLI11; only command.cc and tavrelctl.cc include its headers.
+// Subcommands and their options, over CLI11; only command.cc, command_model.cc and
+// tavrelctl.cc include its headers.
 //
 //   const Command group = top.addGroup("log", "Show submitted logs");
 //   const Command list = group.addCommand("list", "List the pending logs");
@@ -19,6 +20,8 @@ class Option;
 }  // namespace CLI
 
 namespace tavrel {
+
+struct CommandModel;
 
 class Option {
  public:
@@ -59,9 +62,13 @@ class Command {
   /// Text after the options in the help.
   void setFooter(std::string text) const;
 
+  /// Leaves the command out of the help, for commands that only other programs use.
+  void hide() const;
+
   void onRun(std::function<void()> action) const;
 
  private:
+  friend CommandModel modelOf(const Command& program);
   CLI::App* app_;
 };
 

@@ -1,0 +1,56 @@
+#include "platform/linux/runs/run_memory.h"
+
+#include <charconv>
+#include <utility>
+
+namespace tavrel {
+namespace {
+
+// With this line the daemon begins the tasks of a day.
+constexpr std::string_view kTasksBegin = "daily tasks for day ";
+
+}  // namespace
+
+RunMemory::RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::string_view task)
+    : root_(std::move(root)), clock_(clock), log_(log) {
+  run_.began = clock_.now();
+  run_.task = task;
+}
+
+void RunMemory::write(LogLevel level, std::string_view message) {
+  log_.write(level, message);
+  if (level == LogLevel::Error) {
+    run_.addError(message);
+  } else if (level == LogLevel::Default && message.starts_with(kTasksBegin)) {
+    message.remove_prefix(kTasksBegin.size());
+    std::int64_t day = 0;
+    const char* const end = message.data() + message.size();
+    if (std::from_chars(message.data(), end, day).ptr == end) begin(day);
+  }
+}
+
+void RunMemory::begin(std::int64_t day) {
+  run_.day = day;
+  save();
+}
+
+void RunMemory::finish() {
+  if (!run_.day && run_.errorCount == 0) return;
+  run_.isFinished = true;
+  run_.ended = clock_.now();
+  if (run_.day) run_.lastFinished = run_.ended;
+  save();
+}
+
+void RunMemory::save() {
+  if (!std::exchange(isEarlierKnown_, true)) {
+    run_.process = ProcessIdentity::ofThis();
+    const auto earlier = LastRun::read(root_, files_);
+    if (earlier && *earlier) run_.lastFinished = (*earlier)->lastFinished;
+  }
+  if (const Status written = run_.write(root_, files_); !written) {
+    log_.log(LogLevel::Error, "this run will not be remembered: %s", written.error().message);
+  }
+}
+
+}  // namespace tavrel
