@@ -8,6 +8,7 @@
 
 #include "base/format.h"
 #include "base/version.h"
+#include "tools/completion/completion_command.h"
 #include "tools/consent/erase_command.h"
 #include "tools/consent/permission_commands.h"
 #include "tools/device/limits_commands.h"
@@ -94,6 +95,9 @@ constexpr Subcommand kSubcommands[] = {
     {"tidy", addTidyCommand},
 };
 
+// It describes all other commands, so it comes with them.
+constexpr std::string_view kCompletion = "completion";
+
 // The first argument that is neither an option nor the folder of --root; empty when there is none.
 std::string_view firstWord(const std::vector<std::string>& arguments) {
   for (std::size_t i = 0; i < arguments.size(); ++i) {
@@ -116,6 +120,7 @@ void run(const std::vector<std::string>& arguments, ToolContext& context) {
   for (const Subcommand& subcommand : kSubcommands) {
     if (!isNamed || subcommand.name == named) subcommand.add(top, context);
   }
+  if (named == kCompletion) addCompletionCommand(top, context);
 
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));

@@ -253,10 +253,12 @@ void addNandCommands(Command app, ToolContext& context) {
       group.addCommand("counters", "Show the counters of a NAND chip's block");
   addFile(countersCommand, "Counter block of 4096 bytes; - is standard input").required();
   countersCommand.addOption("--chip-id", arguments->chipId, "The controller's, such as K3V")
+      .typeName("ID")
       .required();
   countersCommand
       .addOption("--manufacturer-id", arguments->manufacturerId,
                  "The controller's, in hexadecimal digits")
+      .typeName("ID")
       .required();
   context.addJsonOption(countersCommand);
   countersCommand.onRun([&context, arguments] { counters(context, *arguments); });
@@ -280,6 +282,7 @@ void addNandCommands(Command app, ToolContext& context) {
   addFile(buildCommand, "Its entries, as nand parse --json prints them; - is standard input")
       .required();
   buildCommand.addOption("-o,--output", arguments->output, "File to write; - is standard output")
+      .typeName("OUTPUT")
       .required();
   buildCommand.onRun([&context, arguments] { build(context, *arguments); });
 }

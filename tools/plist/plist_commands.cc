@@ -73,6 +73,7 @@ void addPlistCommands(Command app, ToolContext& context) {
   convertCommand
       .addOption("-o,--output", arguments->output,
                  "File to write, in one step; - is standard output")
+      .typeName("OUTPUT")
       .showDefault();
   convertCommand.onRun([&context, arguments] { convert(context, *arguments); });
 }

@@ -10,8 +10,8 @@ namespace tavrel {
 
 /// An option, or an argument without a dash.
 struct OptionModel {
-  std::vector<std::string> names;  // "-v", "--verbose"; of an argument none
-  std::string value;               // "DAY"; empty for a flag
+  std::vector<std::string> names;    // "-v", "--verbose"; of an argument none
+  std::string value;                 // "DAY"; empty for a flag
   std::vector<std::string> choices;  // the only values, where they are few
   std::string description;
   bool isRequired = false;

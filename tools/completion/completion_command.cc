@@ -1,0 +1,121 @@
+#include "tools/completion/completion_command.h"
+
+#include <algorithm>
+#include <memory>
+#include <ostream>
+#include <set>
+#include <string>
+
+#include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "base/limits.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_submission.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "tools/completion/completion_script.h"
+#include "tools/completion/man_page.h"
+#include "tools/stat/recorded.h"
+
+namespace tavrel {
+namespace {
+
+// Names go to shells. Those with other characters are left out, so that no quoting is needed and no
+// key that somebody recorded means anything to a shell.
+void printWord(ToolContext& context, std::string_view word) {
+  const bool isPlain =
+      !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
+        return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
+               (character >= '0' && character <= '9') ||
+               std::string_view("._-+/@%,").find(character) != std::string_view::npos;
+      });
+  if (isPlain) context.out() << word << '\n';
+}
+
+// Of the last two days with values: a walk over all days would take too long.
+void listKeys(ToolContext& context) {
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
+  auto history =
+      openRecorded(context, {.firstDay = previousDay(today), .lastDay = today, .hasValues = false});
+  if (!history) return context.fail(history.error().message);
+  std::set<std::string> keys;
+  Status read = history->walkScalars(
+      [&](std::string_view key, std::int32_t, std::int64_t, bool&) { keys.emplace(key); });
+  if (read) {
+    read = history->walkDistributions([&](std::string_view key, std::int32_t, std::int64_t,
+                                          BHHistoryDistributionEnumerator&,
+                                          bool&) { keys.emplace(key); });
+  }
+  for (const std::string& key : keys)
+    printWord(context, key);
+  if (!read) context.fail(read.error().message);
+}
+
+void listDays(ToolContext& context) {
+  constexpr std::int64_t kShown = 31;
+  context.out() << "today\nyesterday\n";
+  auto history = openRecorded(context, {.firstDay = 0, .lastDay = 0, .hasValues = false});
+  const auto held = history ? history->daysHeld() : history.error();
+  if (!held || !*held) return;
+  for (std::int64_t day = std::max<std::int64_t>((*held)->last - kShown + 1, (*held)->first);
+       day <= (*held)->last; ++day) {
+    printWord(context, dateText(civilFromDays(day)));
+  }
+}
+
+void listDomains(ToolContext& context) {
+  const auto domains = context.preferences().domains();
+  if (!domains) return context.fail(domains.error().message);
+  for (const std::string& domain : *domains)
+    printWord(context, domain);
+}
+
+void listLogs(ToolContext& context) {
+  context.out() << "latest\n";
+  for (const auto place : {FileSubmission::Place::Pending, FileSubmission::Place::Outbox}) {
+    const auto logs = context.linuxPlatform().submission().files(place);
+    if (!logs) return context.fail(logs.error().message);
+    for (const FileSubmission::FiledLog& log : *logs)
+      printWord(context, log.name);
+  }
+}
+
+void printManPage(ToolContext& context, const std::string& file, const Command& program) {
+  FileSystem files;
+  const auto pageTemplate = files.read(file, limits::kPropertyListBytes);
+  if (!pageTemplate) return context.fail(pageTemplate.error().message);
+  const auto page = manPage(*pageTemplate, modelOf(program));
+  if (!page) return context.fail(file + ": " + page.error().message);
+  context.out() << *page;
+}
+
+}  // namespace
+
+void addCompletionCommand(Command program, ToolContext& context) {
+  struct Arguments {
+    std::string what;
+    std::string file;
+  };
+  const auto arguments = std::make_shared<Arguments>();
+  const Command command =
+      program.addCommand("completion", "Print what shells complete, or the manual page");
+  command.hide();
+  command.addOption("WHAT", arguments->what, "A shell, a list, or man")
+      .required()
+      .oneOf({"bash", "zsh", "fish", "man", "keys", "days", "domains", "logs"});
+  command.addOption("FILE", arguments->file, "Template of the manual page");
+  command.onRun([&context, arguments, program] {
+    const std::string& what = arguments->what;
+    if (what == "keys") return listKeys(context);
+    if (what == "days") return listDays(context);
+    if (what == "domains") return listDomains(context);
+    if (what == "logs") return listLogs(context);
+    if (what == "man") return printManPage(context, arguments->file, program);
+    const CommandModel model = modelOf(program);
+    context.out() << (what == "bash"  ? bashScript(model)
+                      : what == "zsh" ? zshScript(model)
+                                      : fishScript(model));
+  });
+}
+
+}  // namespace tavrel

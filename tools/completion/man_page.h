@@ -1,0 +1,22 @@
+// A manual page from prose, with usage lines and option tables made from the commands.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "base/expected.h"
+#include "tools/shared/command_model.h"
+
+namespace tavrel {
+
+/// Lines of the template that begin with "@":
+///
+///   @command log list    the usage of a command; several in a row share what follows. After the
+///                        prose, before the next of these lines or the next heading, come their
+///                        options, but for --json
+///   @others TITLE        under that heading, the commands that have no line of their own
+///
+/// Fails on a command that the program does not have.
+Expected<std::string> manPage(std::string_view pageTemplate, const CommandModel& program);
+
+}  // namespace tavrel
