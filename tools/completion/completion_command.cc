@@ -35,8 +35,8 @@ void printWord(ToolContext& context, std::string_view word) {
 // Of the last two days with values: a walk over all days would take too long.
 void listKeys(ToolContext& context) {
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  auto history =
-      openRecorded(context, {.firstDay = previousDay(today), .lastDay = today, .hasValues = false});
+  auto history = openRecorded(
+      context, {.key = "", .firstDay = previousDay(today), .lastDay = today, .hasValues = false});
   if (!history) return context.fail(history.error().message);
   std::set<std::string> keys;
   Status read = history->walkScalars(
@@ -54,7 +54,8 @@ void listKeys(ToolContext& context) {
 void listDays(ToolContext& context) {
   constexpr std::int64_t kShown = 31;
   context.out() << "today\nyesterday\n";
-  auto history = openRecorded(context, {.firstDay = 0, .lastDay = 0, .hasValues = false});
+  auto history =
+      openRecorded(context, {.key = "", .firstDay = 0, .lastDay = 0, .hasValues = false});
   const auto held = history ? history->daysHeld() : history.error();
   if (!held || !*held) return;
   for (std::int64_t day = std::max<std::int64_t>((*held)->last - kShown + 1, (*held)->first);

@@ -11,6 +11,7 @@
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
+#include "tools/check/check.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/quantity_text.h"
@@ -141,8 +142,12 @@ void printText(ToolContext& context, const DeviceStatus& status) {
 void addStatusCommand(Command app, ToolContext& context) {
   const Command command =
       app.addCommand("status", "Show the permission, the last run, the store and the pending logs");
+  const auto checks = std::make_shared<bool>(false);
+  command.addFlag("--check", *checks,
+                  "Judge each: exit status 0 ok, 1 warning, 2 critical, 3 unknown");
   context.addJsonOption(command);
-  command.onRun([&context] {
+  command.onRun([&context, checks] {
+    if (*checks) return showChecks(context);
     const DeviceStatus status = takeStatus(context);
     if (context.json()) {
       printJson(context, status);

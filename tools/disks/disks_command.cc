@@ -1,18 +1,13 @@
 #include "tools/disks/disks_command.h"
 
-#include <algorithm>
 #include <initializer_list>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
-#include "base/arithmetic.h"
 #include "base/format.h"
 #include "base/text.h"
-#include "platform/linux/health/drives.h"
-#include "platform/linux/health/reader.h"
-#include "platform/linux/health/verdict.h"
-#include "platform/linux/linux_platform.h"
+#include "tools/disks/disk_list.h"
 #include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
@@ -20,36 +15,6 @@ namespace tavrel {
 namespace {
 
 using namespace health;
-
-struct Disk {
-  Reading reading;
-  Verdict verdict;
-  std::int64_t age = 0;  // seconds
-};
-
-/// Every drive of the machine, and those that only have a reading.
-std::vector<Disk> findDisks(ToolContext& context) {
-  auto [readings, faults] = loadReadings(context.root(), context.linuxPlatform().fileSystem());
-  for (const Error& fault : faults)
-    context.fail(fault.message);
-  const std::int64_t now = saturatingInt64(context.platform().clock->now().secondsSince1970());
-  const std::string boot = bootIDOf(context.root());
-  for (const Drive& drive : findDrives(Machine(context.root()))) {
-    const bool isRead = std::ranges::any_of(
-        readings, [&](const Reading& reading) { return reading.name == drive.name; });
-    if (isRead) continue;
-    readings.push_back(readWithoutCommands(drive));
-    readings.back().time = now;
-  }
-  std::ranges::stable_sort(readings, {}, &Reading::kind);
-  std::vector<Disk> disks;
-  for (Reading& reading : readings) {
-    Verdict verdict = judge(reading, now, boot);
-    const std::int64_t age = std::max<std::int64_t>(now - reading.time, 0);
-    disks.push_back({std::move(reading), std::move(verdict), age});
-  }
-  return disks;
-}
 
 // The first of the named figures that the drive tells.
 const std::int64_t* firstOf(const Disk& disk, std::initializer_list<std::string_view> names) {
@@ -79,13 +44,6 @@ const char* unitName(Unit unit) {
   if (unit == kBytes) return "B";
   if (unit == kMillidegrees) return "mC";
   return unit == kEvents ? "events" : "";
-}
-
-std::string ageText(std::int64_t seconds) {
-  if (seconds < 120) return format("%lld s", seconds);
-  if (seconds < 7200) return format("%lld min", seconds / 60);
-  return seconds < 172'800 ? format("%lld h", seconds / 3600)
-                           : format("%lld days", seconds / 86'400);
 }
 
 Emphasis emphasisOf(const Verdict& verdict) {
@@ -185,7 +143,9 @@ Json jsonOf(const Disk& disk, bool showsSources) {
 }
 
 void showDisks(ToolContext& context, bool showsSources) {
-  const std::vector<Disk> disks = findDisks(context);
+  const auto [disks, faults] = findDisks(context);
+  for (const Error& fault : faults)
+    context.fail(fault.message);
   int status = context.exitStatus();
   for (const Disk& disk : disks)
     status |= disk.verdict.problems;

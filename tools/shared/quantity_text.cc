@@ -51,4 +51,11 @@ std::string percentText(double share) {
   return format("%.1f %%", 100 * share);
 }
 
+std::string ageText(std::int64_t seconds) {
+  if (seconds < 120) return format("%lld s", seconds);
+  if (seconds < 7200) return format("%lld min", seconds / 60);
+  return seconds < 172'800 ? format("%lld h", seconds / 3600)
+                           : format("%lld days", seconds / 86'400);
+}
+
 }  // namespace tavrel

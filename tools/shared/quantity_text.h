@@ -17,4 +17,7 @@ std::string quantityText(double value, std::string_view unit);
 /// "9.1 %" for a share of 0.0908.
 std::string percentText(double share);
 
+/// "90 s", "15 min", "30 h", "12 days".
+std::string ageText(std::int64_t seconds);
+
 }  // namespace tavrel

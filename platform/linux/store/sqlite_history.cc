@@ -8,6 +8,7 @@
 #include "base/text.h"
 #include "platform/linux/store/chunk_reader.h"
 #include "platform/linux/store/sqlite_trim.h"
+#include "platform/linux/store/time_limit.h"
 
 namespace tavrel {
 namespace {
@@ -297,6 +298,26 @@ Expected<std::optional<std::string>> SqliteHistory::segmentPosition(std::uint32_
   });
   if (!read) return read.error();
   return position;
+}
+
+Expected<SqliteHistory::Examination> SqliteHistory::examine(std::chrono::milliseconds time) {
+  Examination examination;
+  const Status read = attempt([&] {
+    const TimeLimit limit(store_->connection, time);
+    try {
+      SqliteStatement statement(store_->connection, "PRAGMA quick_check(1)");
+      if (!statement.step()) return;
+      const std::string_view result = statement.bytes(0);
+      if (result != "ok") examination.fault = result;
+    } catch (const StoreFailure&) {
+      if (!limit.hasPassed()) throw;
+    }
+    // What an interrupted check says of a fault may only mean that it was interrupted.
+    examination.isWhole = !limit.hasPassed();
+    if (!examination.isWhole) examination.fault.clear();
+  });
+  if (!read) return read.error();
+  return examination;
 }
 
 Status SqliteHistory::beginSnapshot() {

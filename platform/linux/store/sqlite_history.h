@@ -7,9 +7,11 @@
 //   if (history) (*history)->walkScalars("com.example.", first, last, handler);
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <functional>
 #include <optional>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -74,6 +76,13 @@ class SqliteHistory : public BHHistory {
   /// since `beginSnapshot`.
   Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
                                                        std::span<const std::byte, 16> identity);
+
+  struct Examination {
+    bool isWhole = true;  // otherwise the time ran out, and what was seen is sound
+    std::string fault;    // the first one that was found; empty when there is none
+  };
+  /// Looks for damage in the file, for about as long as given.
+  Expected<Examination> examine(std::chrono::milliseconds time);
 
   /// From here on all queries see the store as it is at the first of them.
   Status beginSnapshot();

@@ -31,6 +31,7 @@ SqliteLibrary load() {
   if (!library) refuse();
   SqliteLibrary functions{};
   find(library, "sqlite3_open_v2", functions.open_v2);
+  find(library, "sqlite3_interrupt", functions.interrupt);
   find(library, "sqlite3_close_v2", functions.close_v2);
   find(library, "sqlite3_busy_handler", functions.busy_handler);
   find(library, "sqlite3_db_config", functions.db_config);

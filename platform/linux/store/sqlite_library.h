@@ -11,6 +11,7 @@ namespace tavrel {
 /// The functions of the library that the store calls, under their names without "sqlite3_".
 struct SqliteLibrary {
   decltype(&sqlite3_open_v2) open_v2;
+  decltype(&sqlite3_interrupt) interrupt;
   decltype(&sqlite3_close_v2) close_v2;
   decltype(&sqlite3_busy_handler) busy_handler;
   decltype(&sqlite3_db_config) db_config;

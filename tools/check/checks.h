@@ -1,0 +1,37 @@
+// The checks, by what they look at. Each adds one or more to the list.
+#pragma once
+
+#include <optional>
+#include <vector>
+
+#include "base/plist.h"
+#include "tools/check/check.h"
+
+namespace tavrel {
+
+/// What all checks share.
+struct CheckScene {
+  ToolContext& context;
+  std::int64_t now = 0;    // seconds since 1970
+  std::int32_t today = 0;  // UTC
+  std::chrono::milliseconds examination{};
+  std::vector<Check>& checks;
+
+  std::int64_t ageOf(std::int64_t seconds) const { return seconds < now ? now - seconds : 0; }
+  std::int64_t ageOf(plist::Date date) const;
+};
+
+std::int64_t secondsOf(plist::Date date);
+
+void checkPermission(CheckScene& scene);
+void checkClock(CheckScene& scene);
+void checkLastRun(CheckScene& scene);
+void checkLastLog(CheckScene& scene);
+void checkStore(CheckScene& scene);
+/// Limits that were reached, values that were lost, and whether folds are behind.
+void checkRecording(CheckScene& scene);
+void checkQueues(CheckScene& scene);
+void checkUpload(CheckScene& scene);
+void checkDisks(CheckScene& scene);
+
+}  // namespace tavrel

@@ -1,0 +1,145 @@
+// Permission, clock, the last run and its log.
+#include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/runs/last_run.h"
+#include "platform/persisted_state.h"
+#include "tools/check/checks.h"
+#include "tools/log/log_conclusion.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/quantity_text.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel {
+namespace {
+
+constexpr CheckFigureKind kAllowed{"allowed", "tavrel_submission_allowed", "",
+                                   "Whether the daily log may leave the device: 1 or 0."};
+constexpr CheckFigureKind kRunTime{"finished_timestamp_seconds",
+                                   "tavrel_last_run_finished_timestamp_seconds", "seconds",
+                                   "When a run last finished the tasks of a day."};
+constexpr CheckFigureKind kRunErrors{"errors", "tavrel_last_run_errors", "",
+                                     "Errors that the last run logged."};
+
+// Integer: the first day whose statistics may leave, in days since 1970.
+constexpr std::string_view kFirstDayKey = "DiagnosticSubmissionFirstDay";
+
+// A run takes seconds; one that still runs after this waits for something.
+constexpr std::int64_t kLongRun = 3600;
+
+Check lastRunCheck(CheckScene& scene, const LastRun& run) {
+  Check check{"last-run"};
+  if (run.lastFinished) {
+    check.state = stateOfAge(scene.ageOf(*run.lastFinished));
+    check.figures.push_back({&kRunTime, static_cast<double>(secondsOf(*run.lastFinished))});
+  }
+  check.figures.push_back({&kRunErrors, static_cast<double>(run.errorCount)});
+  const std::string age = ageText(scene.ageOf(run.began));
+  const std::string day =
+      run.day ? " of day " + dayText(lowInt32(*run.day)) : std::string(" of no day");
+  if (run.isFinished) {
+    check.text = format("the %s run%s finished, begun %s ago", run.task, day, age);
+  } else if (run.process.isRunning()) {
+    check.text = format("the %s run%s has been running for %s", run.task, day, age);
+    if (scene.ageOf(run.began) >= kLongRun) check.state = graver(check.state, CheckState::Warning);
+  } else {
+    check.text =
+        format("the %s run%s, begun %s ago, was killed before its end", run.task, day, age);
+    check.state = graver(check.state, CheckState::Warning);
+  }
+  if (run.lastFinished && (!run.isFinished || !run.day)) {
+    check.text += format("; the last one to finish a day ended %s ago",
+                         ageText(scene.ageOf(*run.lastFinished)));
+  }
+  if (run.errorCount > 0) {
+    check.state = graver(check.state, CheckState::Warning);
+    check.text += format("; %s", counted(static_cast<std::uint64_t>(run.errorCount), "error"));
+    for (const std::string& error : run.errors)
+      check.text += ": " + error;
+  }
+  return check;
+}
+
+CheckState stateOf(LogOutcome outcome) {
+  switch (outcome) {
+    case LogOutcome::Filed:
+    case LogOutcome::NotPermitted:  // the owner's decision, which the permission tells
+      return CheckState::Ok;
+    case LogOutcome::NoWhitelist:
+    case LogOutcome::NothingToReport:
+      return CheckState::Warning;
+    case LogOutcome::NotFiled:
+      break;
+  }
+  return CheckState::Critical;
+}
+
+}  // namespace
+
+void checkPermission(CheckScene& scene) {
+  Check check{"permission"};
+  FilePreferences& preferences = scene.context.preferences();
+  const plist::Value value =
+      preferences.ZTXPreferencesGetValue(kSubmissionEnabledKey, kDiagnosticsDomain);
+  const plist::Value firstDay =
+      preferences.ZTXPreferencesGetValue(kFirstDayKey, kDiagnosticsDomain);
+  const bool isAllowed = value.boolean().value_or(false);
+  if (scene.context.hasComplaints()) {
+    check.state = CheckState::Unknown;
+    check.text = "preferences cannot be read";
+  } else {
+    check.figures.push_back({&kAllowed, isAllowed ? 1.0 : 0.0});
+    check.text = isAllowed ? "the daily log may leave the device" : "the daily log may not leave";
+    if (!value.isNull() && !value.boolean()) {
+      check.state = CheckState::Warning;
+      check.text = format("%s is %s, which counts as no: set it as a boolean",
+                          kSubmissionEnabledKey, kindWithArticle(value));
+    } else if (isAllowed && !firstDay.isNull() && !firstDay.number()) {
+      check.state = CheckState::Warning;
+      check.text =
+          format("%s is %s: set it as an integer", kFirstDayKey, kindWithArticle(firstDay));
+    } else if (isAllowed && firstDay.number() && firstDay.number()->int64() >= scene.today) {
+      check.text += format(", from day %s on", dayText(firstDay.number()->int32()));
+    }
+  }
+  scene.checks.push_back(std::move(check));
+}
+
+void checkClock(CheckScene& scene) {
+  Check check{"clock"};
+  bool hasRun = false;
+  const std::int32_t lastDay = lowInt32(scene.context.preferences().ZTXPreferencesGetIntegerValue(
+      kLastRunDayKey, kTavrelDomain, &hasRun));
+  check.text = format("today is day %s", dayText(scene.today));
+  if (scene.today < TAVREL_BUILD_DAY) {
+    check.state = CheckState::Critical;
+    check.text += ", before this program was built: set the clock";
+  } else if (hasRun && lastDay >= scene.today) {
+    check.state = CheckState::Warning;
+    check.text += format(
+        ", and day %s was already reported: the clock was set back, and no run comes before then",
+        dayText(lastDay));
+  }
+  scene.checks.push_back(std::move(check));
+}
+
+void checkLastRun(CheckScene& scene) {
+  const auto run = LastRun::read(scene.context.root(), scene.context.linuxPlatform().fileSystem());
+  if (run && *run) return scene.checks.push_back(lastRunCheck(scene, **run));
+  scene.checks.push_back(
+      {"last-run", "", CheckState::Unknown,
+       run ? "no run yet: tavrel-daily.timer starts one each day" : run.error().message});
+}
+
+void checkLastLog(CheckScene& scene) {
+  const LogConclusion conclusion = concludeOnLogs(scene.context);
+  Check check{"last-log"};
+  check.state = conclusion.outcome ? stateOf(*conclusion.outcome) : CheckState::Unknown;
+  check.text = (conclusion.isOfNextRun ? "the next run: " : "the last run: ") + conclusion.text();
+  scene.checks.push_back(std::move(check));
+}
+
+}  // namespace tavrel

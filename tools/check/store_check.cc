@@ -1,0 +1,122 @@
+// The statistics store: whether it can be read, is sound, and has room.
+#include <algorithm>
+#include <cerrno>
+#include <filesystem>
+#include <sys/statvfs.h>
+#include <unistd.h>
+
+#include "base/format.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/files/property_list_file.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "tools/check/checks.h"
+#include "tools/shared/quantity_text.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+constexpr CheckFigureKind kSize{"size_bytes", "tavrel_store_size_bytes", "bytes",
+                                "Size of the statistics store with its log."};
+constexpr CheckFigureKind kFree{"free_bytes", "tavrel_store_free_bytes", "bytes",
+                                "Free space of the file system that holds the store."};
+constexpr CheckFigureKind kSetAside{"set_aside", "tavrel_store_set_aside", "",
+                                    "Damaged stores that were set aside and are still there."};
+
+// Below this a run may not find room for its log and the store's.
+constexpr double kLittleSpace = 4 << 20;
+
+// What the store may take beyond its limit: its log, which is emptied at 1 MiB and more.
+constexpr double kBeyondLimit = 4 << 20;
+
+void add(Check& check, CheckState state, const std::string& text) {
+  check.state = graver(check.state, state);
+  check.text += (check.text.empty() ? "" : "; ") + text;
+}
+
+std::optional<double> limitOf(CheckScene& scene) {
+  LinuxPlatform& device = scene.context.linuxPlatform();
+  const auto limits = readDictionaryFile(device.fileSystem(), device.platform().propertyLists,
+                                         device.platform().log,
+                                         scene.context.root().path("/etc/tavrel/limits.plist"));
+  const auto bytes = limits.dictionary("Store").number("Bytes");
+  return bytes ? std::optional(bytes->real()) : std::nullopt;
+}
+
+void checkSize(CheckScene& scene, const std::string& path, Check& check) {
+  double size = 0;
+  for (const char* ending : {"", "-wal"}) {
+    const auto status = FileSystem::status(path + ending);
+    if (status) size += static_cast<double>(status->st_size);
+  }
+  check.figures.push_back({&kSize, size});
+  add(check, CheckState::Ok, sizeText(size));
+  const auto limit = limitOf(scene);
+  if (limit && size > *limit + kBeyondLimit) {
+    add(check, CheckState::Warning, "more than the limit of " + sizeText(*limit));
+  }
+  struct statvfs space {};
+  if (statvfs(path.c_str(), &space) != 0) return;
+  const double free = static_cast<double>(space.f_bavail) * static_cast<double>(space.f_frsize);
+  check.figures.push_back({&kFree, free});
+  if (free < kLittleSpace) {
+    add(check, CheckState::Critical,
+        "only " + sizeText(free) + " are free: free some space in its file system");
+  }
+}
+
+void examine(CheckScene& scene, const std::string& path, Check& check) {
+  const auto history = scene.context.storeForReading().openHistory();
+  const auto found = history ? (*history)->examine(scene.examination)
+                             : Expected<SqliteHistory::Examination>(history.error());
+  if (!found) {
+    const bool mayRead = access(path.c_str(), R_OK) == 0;
+    return add(check, mayRead ? CheckState::Critical : CheckState::Unknown, found.error().message);
+  }
+  if (!found->fault.empty()) {
+    return add(check, CheckState::Critical, "damaged: " + found->fault);
+  }
+  add(check, CheckState::Ok,
+      found->isWhole ? "no damage" : "no damage in the part that there was time for");
+}
+
+// Files beside the store that somebody should look at.
+void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
+  const std::filesystem::path file(path);
+  const auto names = scene.context.linuxPlatform().fileSystem().list(file.parent_path().string());
+  if (!names) return;
+  const std::string name = file.filename().string();
+  const auto damaged = std::ranges::count_if(*names, [&](const std::string& other) {
+    return other.starts_with(name + ".corrupt-") && !other.ends_with("-wal") &&
+           !other.ends_with("-shm");
+  });
+  check.figures.push_back({&kSetAside, static_cast<double>(damaged)});
+  if (damaged > 0) {
+    add(check, CheckState::Warning,
+        counted(static_cast<std::uint64_t>(damaged), "damaged store") + " set aside in " +
+            file.parent_path().string());
+  }
+  if (FileSystem::status(path + "-kept")) {
+    add(check, CheckState::Warning, "values wait in " + path + "-kept for a commit");
+  }
+}
+
+}  // namespace
+
+void checkStore(CheckScene& scene) {
+  Check check{"store"};
+  const std::string& path = scene.context.storeForReading().path();
+  if (FileSystem::status(path)) {
+    checkSize(scene, path, check);
+    examine(scene, path, check);
+  } else if (errno == ENOENT || errno == ENOTDIR) {
+    add(check, CheckState::Ok, "none yet");
+  } else {
+    add(check, CheckState::Unknown, path + " cannot be looked at: run as root");
+  }
+  checkCompanions(scene, path, check);
+  scene.checks.push_back(std::move(check));
+}
+
+}  // namespace tavrel

@@ -1,0 +1,28 @@
+// The drives of the device with what is known of their health.
+#pragma once
+
+#include <cstdint>
+#include <vector>
+
+#include "base/expected.h"
+#include "platform/linux/health/reading.h"
+#include "platform/linux/health/verdict.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+struct Disk {
+  health::Reading reading;
+  health::Verdict verdict;
+  std::int64_t age = 0;  // seconds
+};
+
+struct DiskList {
+  std::vector<Disk> disks;    // by kind
+  std::vector<Error> faults;  // of files that are not readings
+};
+
+/// Every drive of the machine, and those that only have a reading.
+DiskList findDisks(ToolContext& context);
+
+}  // namespace tavrel
