@@ -17,6 +17,7 @@
 #include "tools/device/status_command.h"
 #include "tools/device/tasking_commands.h"
 #include "tools/disks/disks_command.h"
+#include "tools/export/export_commands.h"
 #include "tools/log/log_commands.h"
 #include "tools/log/nandlog_commands.h"
 #include "tools/nand/nand_commands.h"
@@ -93,6 +94,7 @@ constexpr Subcommand kSubcommands[] = {
     {"report", addReportCommands},
     {"limits", addLimitsCommand},
     {"tidy", addTidyCommand},
+    {"export", addExportCommands},
 };
 
 // It describes all other commands, so it comes with them.

@@ -1,0 +1,10 @@
+// tavrelctl export: figures in the forms of other programs.
+#pragma once
+
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+void addExportCommands(Command app, ToolContext& context);
+
+}  // namespace tavrel
