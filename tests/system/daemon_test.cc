@@ -7,6 +7,7 @@
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
+#include "platform/linux/runs/last_run.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
 #include "platform/linux/service/service_socket.h"
@@ -161,6 +162,66 @@ TEST(DaemonTest, RunsOnceADayAndByForce) {
   device.logOf("-f");
   EXPECT_EQ(device.pendingLogs().size(), 2U);
   EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
+}
+
+TEST(DaemonTest, RemembersWhetherARunFinished) {
+  const Device device;
+  FileSystem files;
+  const auto record = [&] {
+    auto run = LastRun::read(device.root, files);
+    EXPECT_TRUE(run);
+    return *std::move(run);
+  };
+  int killed = 0;
+  std::size_t calls = 200;
+  for (; runUntilSystemCall(calls, [&] { device.execute("-d"); }); calls += 100) {
+    const auto run = record();
+    if (!run || run->isFinished) continue;
+    ++killed;
+    EXPECT_EQ(run->day, device.yesterday);
+    EXPECT_EQ(run->task, "daily");
+    EXPECT_FALSE(run->process.isRunning());
+  }
+  EXPECT_GE(killed, 2);
+  device.logOf("-f");
+  const auto done = record();
+  ASSERT_TRUE(done);
+  EXPECT_TRUE(done->isFinished);
+  EXPECT_EQ(done->task, "forced");
+  EXPECT_EQ(done->lastFinished, done->ended);
+
+  // A run with nothing to do leaves the record alone, and one that cannot write it goes on.
+  const std::string before = contentOf(device.root.path(kLastRunFile));
+  device.logOf("-d");
+  EXPECT_EQ(contentOf(device.root.path(kLastRunFile)), before);
+  std::filesystem::remove(device.root.path(kLastRunFile));
+  std::filesystem::create_directories(device.root.path(kLastRunFile) + "/x");
+  const std::string log = device.logOf("-t");
+  EXPECT_NE(log.find("error this run will not be remembered: "), log.npos) << log;
+  EXPECT_NE(log.find("default tavrel ended\n"), log.npos) << log;
+}
+
+TEST(DaemonTest, KeepsTheFirstErrorsOfARun) {
+  const TemporaryRoot folder;
+  FileSystem files;
+  LastRun run;
+  run.day = 20000;
+  run.process = ProcessIdentity::ofThis();
+  for (int i = 0; i < 12; ++i)
+    run.addError(std::string(299, 'x') + "ü\x01");
+  ASSERT_TRUE(run.write(folder.root, files));
+  const auto read = LastRun::read(folder.root, files);
+  ASSERT_TRUE(read && *read);
+  EXPECT_EQ((*read)->errorCount, 12);
+  EXPECT_EQ((*read)->errors, Lines(10, std::string(299, 'x') + "…"));
+  EXPECT_TRUE((*read)->process.isRunning());
+  EXPECT_FALSE((ProcessIdentity{::getpid(), run.process.started, "earlier"}.isRunning()));
+  EXPECT_FALSE(
+      (ProcessIdentity{::getpid(), run.process.started + 1, run.process.boot}.isRunning()));
+  folder.write(kLastRunFile, "garbage");
+  EXPECT_EQ(LastRun::read(folder.root, files).error().message,
+            "cannot use " + folder.root.path(kLastRunFile) +
+                ": it is not the record of a run: remove it");
 }
 
 TEST(DaemonTest, RefusesADeviceThatIsNotThere) {

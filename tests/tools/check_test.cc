@@ -1,0 +1,200 @@
+// tavrelctl status --check
+#include <chrono>
+#include <unistd.h>
+
+#include "base/iso_date.h"
+#include "device.h"
+#include "platform/linux/runs/last_run.h"
+
+namespace tavrel {
+namespace {
+
+constexpr double kHour = 3600, kDay = 86'400;
+
+plist::Date ago(double seconds) {
+  const std::chrono::duration<double> now = std::chrono::system_clock::now().time_since_epoch();
+  return plist::Date::since1970(now.count() - seconds);
+}
+
+std::int64_t today() {
+  return static_cast<std::int64_t>(ago(0).secondsSince1970() / kDay);
+}
+
+std::string isoAgo(double seconds) {
+  return isoDateText(plist::Date::sinceEpoch(std::floor(ago(seconds).secondsSinceEpoch())));
+}
+
+/// A name of a log that was filed so long ago.
+std::string logName(double seconds) {
+  std::string stamp = isoAgo(seconds);
+  std::erase_if(stamp, [](char c) { return c == '-' || c == ':'; });
+  return "log-tallied-" + stamp + "-0011aabb";
+}
+
+struct CheckTest : testing::Test {
+  const TemporaryDevice device;
+
+  /// The line of one check, without what its text has of times.
+  void expect(const std::string& line, int status) const {
+    const Outcome outcome = device.run("status --check");
+    EXPECT_EQ(outcome.status, status) << outcome;
+    EXPECT_NE(("\n" + outcome.out).find("\n" + line), std::string::npos) << line << '\n' << outcome;
+  }
+
+  void writeRun(double finishedAgo, bool isFinished, int errors = 0) const {
+    FileSystem files;
+    LastRun run;
+    run.began = ago(kHour * 5);
+    run.task = "daily";
+    run.day = 20000;
+    run.isFinished = isFinished;
+    run.lastFinished = ago(finishedAgo);
+    for (int i = 0; i < errors; ++i)
+      run.addError("cannot do " + std::to_string(i));
+    ASSERT_TRUE(run.write(device.root, files));
+  }
+};
+
+TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
+  writeRun(kHour, true);
+  device.check("status --check",
+               prints("OK permission: the daily log may not leave\n"
+                      "OK clock: today is day " +
+                      std::to_string(today()) + " (" + isoAgo(0).substr(0, 10) +
+                      ")\n"
+                      "OK last-run: the daily run of day 20000 (2024-10-04) finished, begun 5 h "
+                      "ago\n"
+                      "OK last-log: the next run: no log for day " +
+                      std::to_string(today() - 1) + " (" + isoAgo(kDay).substr(0, 10) +
+                      "): diagnostic submission not allowed\n"
+                      "OK store: none yet\n"
+                      "OK limits: none since yesterday\n"
+                      "OK lost-values: none since yesterday\n"
+                      "OK folding: no program records in memory\n"
+                      "OK queue pending: empty\n"
+                      "OK queue outbox: empty\n"
+                      "OK queue withheld: empty\n"
+                      "OK queue refused: empty\n"
+                      "OK upload: no attempt yet\n"
+                      "OK disk: no drive tells its health\n"));
+  const auto json = device.json("status --check");
+  EXPECT_EQ(json["state"], "ok");
+  EXPECT_EQ(json["checks"][2]["figures"]["errors"], 0);
+  EXPECT_EQ(device.runAt(device.path("/none"), "status --check").status, 3);
+}
+
+TEST_F(CheckTest, TellsHowTheLastRunsWent) {
+  const std::string run = "last-run: the daily run of day 20000 (2024-10-04)";
+  expect("UNKNOWN last-run: no run yet", 3);
+  writeRun(kHour, false);
+  expect("WARNING " + run +
+             ", begun 5 h ago, was killed before its end; the last one to finish a "
+             "day ended 60 min ago\n",
+         1);
+  writeRun(2 * kDay - 60, true);
+  expect("OK " + run + " finished", 0);
+  writeRun(2 * kDay + 60, true);
+  expect("WARNING " + run + " finished", 1);
+  writeRun(7 * kDay + 60, true);
+  expect("CRITICAL " + run + " finished", 2);
+  writeRun(kHour, true, 2);
+  expect("WARNING " + run + " finished, begun 5 h ago; 2 errors: cannot do 0: cannot do 1\n", 1);
+}
+
+TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
+  writeRun(kHour, true);
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true");
+  expect("WARNING permission: DiagnosticSubmissionEnabled is a string, which counts as no", 1);
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
+  expect("OK permission: the daily log may leave the device\n", 1);
+  expect("WARNING last-log: the next run: no log for day", 1);  // without a whitelist
+  device.run({"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionFirstDay", "--int",
+              std::to_string(today() + 1)});
+  expect("OK permission: the daily log may leave the device, from day", 1);
+  device.run({"prefs", "set", "com.norvane.tallied.tavrel", "--int",
+              "LastCrashLogSerializationDateInDaysSince1970", std::to_string(today())});
+  expect("WARNING clock: today is day", 1);
+}
+
+TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
+  writeRun(kHour, true);
+  const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+  std::string values;
+  for (int i = 0; i < 3000; ++i)
+    values += "scalar\t20000\tcom.example.key." + std::to_string(i) + "\t1\n";
+  device.run("stat import -", values);
+  sync();
+  expect("OK store: ", 0);
+  device.write(store + ".corrupt-1", "");
+  device.write(store + "-kept", "");
+  expect("WARNING store: ", 1);
+  EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
+            std::string::npos);
+  device.write("/etc/tavrel/limits.plist", xmlOf(R"({"Store": {"Bytes": 1}})"));
+  std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
+  ASSERT_GT(bytes.size(), 100'000U);
+  std::filesystem::remove(device.path(store + "-wal"));
+  std::filesystem::remove(device.path(store + "-shm"));
+  bytes.resize(100'000, 'x');
+  device.write(store, "SQLite format 3" + bytes);
+  expect("CRITICAL store: ", 2);
+}
+
+TEST_F(CheckTest, JudgesQueuesByTheirOldestLog) {
+  writeRun(kHour, true);
+  const std::string kFolder = kSubmission;
+  for (const auto& [place, age, line, status] :
+       {std::tuple("pending", 3 * kHour, "OK queue pending: 1 log, the oldest filed 3 h ago\n", 0),
+        {"pending", 50 * kHour, "WARNING queue pending: 2 logs, the oldest filed 2 days ago\n", 1},
+        {"outbox", 8 * kDay, "CRITICAL queue outbox: 1 log, the oldest filed 8 days ago\n", 2},
+        {"withheld", 900 * kDay, "OK queue withheld: 1 log, the oldest filed 900 days ago\n", 2},
+        {"refused", kHour, "WARNING queue refused: 1 log, the oldest filed 60 min ago\n", 2}}) {
+    device.write(kFolder + place + "/" + logName(age) + ".log", "");
+    device.write(kFolder + place + "/" + logName(age) + ".metadata.plist", "");
+    expect(line, status);
+  }
+}
+
+TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
+  writeRun(kHour, true);
+  const auto state = [&](double success, int failed) {
+    device.write(
+        "/var/lib/tavrel/upload/state.plist",
+        xmlOf(R"({"LastSuccess": {"$date": ")" + isoAgo(success) +
+              R"("}, "Failure": "no route", "FailedAttempts": )" + std::to_string(failed) + "}"));
+  };
+  state(30 * kDay, 0);
+  expect("OK upload: a log was last sent 30 days ago\n", 0);
+  state(kHour, 4);
+  expect("OK upload: a log was last sent 60 min ago; 4 attempts failed since: no route\n", 0);
+  state(8 * kDay, 4);
+  expect("CRITICAL upload: ", 2);
+  device.write("/var/lib/tavrel/upload/state.plist", xmlOf(R"({"FailedAttempts": 1})"));
+  expect("WARNING upload: never sent; 1 attempt failed since: reason unknown\n", 1);
+  device.run("stat import -",
+             "scalar\tyesterday\tcom.norvane.tavrel.limits.store.days\t3\n"
+             "scalar\ttoday\tcom.norvane.brimhold.dropped\t0\n"
+             "scalar\t20000\tcom.norvane.brimhold.dropped\t7\n");
+  expect("WARNING limits: since yesterday: store.days 3\n", 1);
+  expect("OK lost-values: none since yesterday\n", 1);
+  device.run("stat import -", "scalar\ttoday\tcom.norvane.brimhold.dropped\t9\n");
+  expect("WARNING lost-values: since yesterday: dropped 9\n", 1);
+}
+
+TEST_F(CheckTest, ShowsTheVerdictOfEachDisk) {
+  writeRun(kHour, true);
+  const auto reading = [&](const std::string& figures) {
+    device.write("/run/tavrel/health/nvme0.plist",
+                 xmlOf(R"({"version": 1, "name": "nvme0", "kind": "nvme", "time": {"$date": ")" +
+                       isoAgo(3 * kHour) + R"("}, "figures": {)" + figures + "}}"));
+  };
+  reading(R"("used_pct": 3)");
+  expect("OK disk nvme0: good, read 3 h ago\n", 0);
+  reading(R"("used_pct": 100)");
+  expect("WARNING disk nvme0: worn, used_pct is 100, read 3 h ago\n", 1);
+  reading(R"("critical_warning": 1)");
+  expect("CRITICAL disk nvme0: failing, critical_warning is 1, read 3 h ago\n", 2);
+}
+
+}  // namespace
+}  // namespace tavrel
