@@ -83,10 +83,15 @@ Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
   Check check{"folding"};
   LinuxPlatform& device = scene.context.linuxPlatform();
   const auto listing = folder.list();
-  const auto segments = listing.segments.size();
+  if (!listing) {
+    check.state = CheckState::Unknown;
+    check.text = listing.error().message;
+    return check;
+  }
+  const auto segments = listing->segments.size();
   check.figures.push_back({&kSegments, static_cast<double>(segments)});
   const auto user = geteuid();
-  for (const SegmentEntry& entry : listing.segments) {
+  for (const SegmentEntry& entry : listing->segments) {
     if (user == 0 || entry.owner == user) continue;
     check.state = CheckState::Unknown;
     check.text = "segments of other users cannot be read: run as root";
