@@ -110,6 +110,18 @@ TEST(LiveMachineTest, ManyInterfacesHideNothing) {
   EXPECT_TRUE(text.ends_with(" if9999.rx_bytes=9999 if9999.rx_packets=2 "));
 }
 
+TEST(LiveMachineTest, ShowsTheInterfacesOfProcessOne) {
+  DeviceServices device;
+  const auto shown = [&device] {
+    LiveMachine live(device.root, device.log);
+    return Subscribed(live).update();
+  };
+  device.write("/proc/net/dev", "one\ntwo\nlo: 1 2\n");
+  EXPECT_EQ(shown(), "lo.rx_bytes=1 lo.rx_packets=2 ");
+  device.write("/proc/1/net/dev", "one\ntwo\neth0: 3 4\n");
+  EXPECT_EQ(shown(), "eth0.rx_bytes=3 eth0.rx_packets=4 ");
+}
+
 // Of drives, only what was read in this boot and within two days.
 TEST(LiveMachineTest, ShowsReadingsOfDrivesThatHold) {
   using namespace health;

@@ -1,5 +1,6 @@
 // Sources whose texts are tables: disks, network interfaces, processors, memory, pressure.
 #include <string>
+#include <string_view>
 #include <unistd.h>
 #include <vector>
 
@@ -37,7 +38,12 @@ constexpr Column kDisk[] = {
     {19, "flush_time", kMilliseconds},
 };
 
-// Tokens of /proc/net/dev: 0 is the name.
+// Interfaces of the machine, also for a process that has a network of its own; and, where process 1
+// is hidden, those of the reader.
+constexpr std::string_view kMachineInterfaces = "/proc/1/net/dev";
+constexpr std::string_view kOwnInterfaces = "/proc/net/dev";
+
+// Tokens of a line of interfaces: 0 is the name.
 constexpr Column kInterface[] = {
     {1, "rx_bytes", kBytes, {}, {"net.rx_bytes"}},
     {2, "rx_packets", kPackets},
@@ -202,8 +208,9 @@ void addBlockDevices(const DeviceRoot& root, LiveSource& source) {
 }
 
 void addNetwork(const DeviceRoot& root, LiveSource& source) {
+  const bool machine = access(root.path(kMachineInterfaces).c_str(), R_OK) == 0;
   addDeviceTable(root,
-                 {.path = "/proc/net/dev",
+                 {.path = machine ? kMachineInterfaces : kOwnInterfaces,
                   .group = "Network",
                   .form = {.headings = 2},
                   .columns = kInterface,

@@ -1,0 +1,10 @@
+# Installs one unit with the paths that the programs have under the prefix of this installation.
+foreach(folder to sbin bin)
+  cmake_path(ABSOLUTE_PATH ${folder} BASE_DIRECTORY "${CMAKE_INSTALL_PREFIX}")
+endforeach()
+cmake_path(GET unit FILENAME name)
+file(READ "${unit}" text)
+string(REPLACE "/usr/sbin/tavrel" "${sbin}/tavrel" text "${text}")
+string(REPLACE "/usr/bin/tavrel" "${bin}/tavrel" text "${text}")
+file(WRITE "${made_in}/units/${name}" "${text}")
+file(INSTALL DESTINATION "${to}" TYPE FILE FILES "${made_in}/units/${name}")
