@@ -6,7 +6,8 @@ namespace {
 TEST_F(Recording, InstalledFilesBuildTheExamples) {
   const std::string to = root / "installed";
   const std::string examples = TAVREL_EXAMPLES "/record";
-  outputOf("cmake --install " TAVREL_BUILD " --component brimhold --prefix " + to);
+  for (const char* component : {"libbrimhold1", "libbrimhold-dev", "python3-brimhold"})
+    outputOf("cmake --install " TAVREL_BUILD " --prefix " + to + " --component " + component);
   const std::string pc = outputOf("find " + to + " -name brimhold.pc");
   const std::string lib = std::filesystem::path(pc).parent_path().parent_path();
   std::string flags =
