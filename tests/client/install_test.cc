@@ -42,5 +42,16 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
             "0\n");
 }
 
+TEST_F(Recording, InstalledUnitsNameTheirPrograms) {
+  const std::string to = root / "elsewhere";
+  outputOf("DESTDIR=" + to +
+           " cmake --install " TAVREL_BUILD " --prefix /opt/x --component tavrel-statsd");
+  const std::string unit = to + "/opt/x/lib/systemd/system/tavrel-statsd.service";
+  const std::string program = "/opt/x/sbin/tavrel-statsd";
+  EXPECT_EQ(outputOf("grep ^ExecStart= " + unit), "ExecStart=" + program + "\n");
+  EXPECT_EQ(outputOf(to + program + " --version"),
+            outputOf(TAVREL_BUILD "/bin/tavrel-statsd --version"));
+}
+
 }  // namespace
 }  // namespace tavrel
