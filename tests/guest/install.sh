@@ -1,0 +1,44 @@
+# Installs the packages while the clock stands in 1970, as that of a device without a battery does.
+# shellcheck shell=sh
+
+# Units of tavrel share a slice, which adds up their CPU time.
+for unit in tavrel.service tavrel-.service; do
+  mkdir -p "/run/systemd/system/$unit.d"
+  printf '[Service]\nSlice=tavrel.slice\n' >"/run/systemd/system/$unit.d/slice.conf"
+done
+systemctl daemon-reload
+systemd-run --quiet --unit=keeps-slice --slice=tavrel.slice sleep infinity
+find / -xdev | sort >/root/before
+
+date --utc --set '1970-01-01 00:20' >/dev/null
+export DEBIAN_FRONTEND=noninteractive
+apt-get install -qq -y --no-install-recommends "$packages"/tavrel_*.deb \
+  "$packages"/tavrel-statsd_*.deb "$packages"/tavrel-upload_*.deb "$packages"/libbrimhold1_*.deb \
+  "$packages"/python3-brimhold_*.deb >/root/apt.log 2>&1
+expect "packages are installed" 0 "$?"
+settle
+expect "what is enabled" "tavrel-collect.timer
+tavrel-daily.timer
+tavrel-fold-shutdown.service
+tavrel-fold.path
+tavrel-fold.timer
+tavrel-health.timer
+tavrel-upload.path
+tavrel-upload.timer
+tavrel.socket" "$(systemctl list-unit-files --no-legend --state=enabled 'tavrel*' | awk '{print $1}')"
+expect "what is resident" "tavrel-collect.timer
+tavrel-daily.timer
+tavrel-fold-shutdown.service
+tavrel-fold.path
+tavrel-fold.timer
+tavrel-health.timer
+tavrel-upload.path
+tavrel-upload.timer
+tavrel.socket" "$(systemctl list-units --no-legend --plain --state=active 'tavrel*.service' \
+  'tavrel*.timer' 'tavrel*.path' 'tavrel*.socket' | awk '{print $1}' | grep -v folders)"
+expect "folder of those who record" "1770 root brimhold" "$(stat -c '%a %U %G' /run/tavrel/stat)"
+systemctl start tavrel-daily.service
+expect "a run in 1970" "success 0" "$(outcome tavrel-daily.service)"
+expect "its day is remembered" 0 "$(tavrelctl prefs get com.norvane.tallied.tavrel \
+  LastCrashLogSerializationDateInDaysSince1970 2>&1)"
+expect "nothing is filed in 1970" "" "$(logs pending)"
