@@ -17,7 +17,7 @@ apt-get install -qq -y --no-install-recommends "$packages"/tavrel_*.deb \
   "$packages"/python3-brimhold_*.deb >/root/apt.log 2>&1
 expect "packages are installed" 0 "$?"
 settle
-expect "what is enabled" "tavrel-collect.timer
+units="tavrel-collect.timer
 tavrel-daily.timer
 tavrel-fold-shutdown.service
 tavrel-fold.path
@@ -25,20 +25,15 @@ tavrel-fold.timer
 tavrel-health.timer
 tavrel-upload.path
 tavrel-upload.timer
-tavrel.socket" "$(systemctl list-unit-files --no-legend --state=enabled 'tavrel*' | awk '{print $1}')"
-expect "what is resident" "tavrel-collect.timer
-tavrel-daily.timer
-tavrel-fold-shutdown.service
-tavrel-fold.path
-tavrel-fold.timer
-tavrel-health.timer
-tavrel-upload.path
-tavrel-upload.timer
-tavrel.socket" "$(systemctl list-units --no-legend --plain --state=active 'tavrel*.service' \
-  'tavrel*.timer' 'tavrel*.path' 'tavrel*.socket' | awk '{print $1}' | grep -v folders)"
+tavrel.socket"
+expect "what is enabled" "$units" \
+  "$(systemctl list-unit-files --no-legend --state=enabled 'tavrel*' | awk '{print $1}' | sort)"
+expect "what is active: no process" "$units" "$(systemctl list-units --no-legend --plain \
+  --state=active 'tavrel*' | awk '{print $1}' | grep -Ev '^tavrel(-folders.service|.slice)$' | sort)"
+expect "processes" 1 "$(wc -w </sys/fs/cgroup/tavrel.slice/keeps-slice.service/cgroup.procs)"
 expect "folder of those who record" "1770 root brimhold" "$(stat -c '%a %U %G' /run/tavrel/stat)"
 systemctl start tavrel-daily.service
 expect "a run in 1970" "success 0" "$(outcome tavrel-daily.service)"
-expect "its day is remembered" 0 "$(tavrelctl prefs get com.norvane.tallied.tavrel \
-  LastCrashLogSerializationDateInDaysSince1970 2>&1)"
-expect "nothing is filed in 1970" "" "$(logs pending)"
+expect "it files nothing" "" "$(logs pending)"
+expect "the wrong clock is told" "CRITICAL clock: today is day 0 (1970-01-01), before this program \
+was built: set the clock" "$(tavrelctl status --check | grep ' clock: ')"
