@@ -1,6 +1,6 @@
 # What the scripts of the guest share. They print a line for each check; the status of `checked` is 1
 # when one of them failed.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 failures=0
 
 # expect WHAT EXPECTED ACTUAL: both texts are the same, byte by byte.

@@ -1,5 +1,5 @@
 # Three days by the clock: what is recorded on one leaves the device on the next.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 clock '2026-11-20 22:40'
 mkdir -p '/Library/Application Support/Brimhold' /etc/tavrel
 cp "$here/whitelist.plist" '/Library/Application Support/Brimhold/Whitelist_Pellio.plist'
@@ -22,6 +22,8 @@ expect "nothing of the day of the permission is filed" "" "$(logs pending)$(logs
 record 12
 record 4
 
+# Counted exactly: no sample but these.
+systemctl stop tavrel-collect.timer
 # The day that is measured: a sample for each minute, the folds, the run and the upload.
 clock '2026-11-22 00:00'
 echo "minutes and hours of a day"
@@ -54,7 +56,9 @@ log-tallied" "$(received)"
 expect "samples of the measured day" "$((24 * $(echo "$samples" | wc -w)))" \
   "$(tavrelctl stat show com.norvane.usage.samples --json | python3 -c '
 import json, sys
-print([day["value"] for day in json.load(sys.stdin)["days"] if day["date"] == "2026-11-22"][0])')"
+days = json.load(sys.stdin)["scalar"]["days"]
+print(*[day["value"] for day in days if day["date"] == "2026-11-22"])')"
+systemctl start tavrel-collect.timer
 expect "no unit failed" "" "$(systemctl list-units --no-legend --plain --state=failed 'tavrel*')"
 note "CPU time of the day: $((day_used / 1000)) ms at an instruction a nanosecond"
 note "written in the day: $day_writes bytes"

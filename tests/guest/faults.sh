@@ -1,6 +1,6 @@
 # Every unit with its folders missing, read-only, full, and owned by others. A unit that cannot work
 # fails with a status and a line; none is ended by a signal or hangs.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 folders="/var/mobile /var/lib/tavrel /run/tavrel"
 
 outcomes() {

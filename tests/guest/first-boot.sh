@@ -1,11 +1,12 @@
 #!/bin/sh
 # The first start of the guest's system, up to a pulled plug.
 #   first-boot.sh PACKAGES LATER-PACKAGES
+# shellcheck disable=SC2034 # The parts use the variables.
 set -u
 here=$(dirname "$0")
 packages=$1 later=$2
 later_version=$(dpkg-deb -f "$later"/tavrel_*.deb Version)
-samples=$(seq 3)
+samples=$(seq 60)
 for part in check install server days upgrade; do
   # shellcheck source=/dev/null
   . "$here/$part.sh"

@@ -1,5 +1,5 @@
 # Installs the packages while the clock stands in 1970, as that of a device without a battery does.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 
 # Units of tavrel share a slice, which adds up their CPU time.
 for unit in tavrel.service tavrel-.service; do

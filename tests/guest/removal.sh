@@ -1,5 +1,5 @@
 # Removal and purge.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 nginx -s quit 2>/dev/null
 apt-get remove -qq -y '*tavrel*' '*brimhold*' >/root/apt.log 2>&1
 expect "the packages are removed" 0 "$?"

@@ -1,5 +1,5 @@
 # A server that takes logs: nginx in the guest, with the documented configuration.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 server=/etc/tavrel-server
 mkdir -p "$server" /srv/tavrel/.unfinished /etc/credstore
 chown www-data: /srv/tavrel /srv/tavrel/.unfinished

@@ -1,5 +1,5 @@
 # What the tool says after the plug was pulled, and that the next run makes up for it.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 day_done() {
   tavrelctl prefs get com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970
 }

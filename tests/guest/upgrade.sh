@@ -1,5 +1,5 @@
 # A client of the service, an upgrade with data, and a run in whose middle the plug is pulled.
-# shellcheck shell=sh
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 socket=/run/tavrel/com.norvane.tallied.tavrel.socket
 expect "the service sleeps" inactive "$(systemctl is-active tavrel.service)"
 tavrelctl send force yesterday
