@@ -1,6 +1,5 @@
 # Three days by the clock: what is recorded on one leaves the device on the next.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
-clock '2026-11-20 22:40'
 mkdir -p '/Library/Application Support/Brimhold' /etc/tavrel
 cp "$here/whitelist.plist" '/Library/Application Support/Brimhold/Whitelist_Pellio.plist'
 
@@ -16,8 +15,8 @@ record() {
 tavrelctl allow >/dev/null
 expect "permission is given" 0 "$?"
 record 5
-clock '2026-11-21 00:07'
-clock '2026-11-21 01:07'
+clock '2037-11-21 00:07'
+clock '2037-11-21 01:07'
 expect "nothing of the day of the permission is filed" "" "$(logs pending)$(logs outbox)"
 record 12
 record 4
@@ -25,18 +24,18 @@ record 4
 # Counted exactly: no sample but these.
 systemctl stop tavrel-collect.timer
 # The day that is measured: a sample for each minute, the folds, the run and the upload.
-clock '2026-11-22 00:00'
+clock '2037-11-22 00:00'
 echo "minutes and hours of a day"
 writes=$(written) used=$(processor)
 for hour in 00 01 02 03 04 05 06 07 08 09 10 11 12 13 14 15 16 17 18 19 20 21 22 23; do
-  clock "2026-11-22 $hour:07"
+  clock "2037-11-22 $hour:07"
   for sample in $samples; do
     systemctl start tavrel-collect.service
   done
   # As the kernel and the journal do some time after a change.
   journalctl --quiet --sync && sync
 done
-clock '2026-11-23 00:01'
+clock '2037-11-23 00:01'
 day_writes=$(($(written) - writes)) day_used=$(($(processor) - used))
 expect "the day after, its log is at the server" log-tallied "$(received)"
 expect "what the server has of it" "starts 20
@@ -49,15 +48,15 @@ print("seconds", log["BHDistributions"]["com.example.seconds"])
 print("seconds", log["BHDistributionsHistogram"]["com.example.seconds"])')"
 expect "nothing waits" "" "$(logs pending)$(logs outbox)"
 record 3
-clock '2026-11-23 01:07'
-clock '2026-11-24 00:01'
+clock '2037-11-23 01:07'
+clock '2037-11-24 00:01'
 expect "the next day's log, too" "log-tallied
 log-tallied" "$(received)"
 expect "samples of the measured day" "$((24 * $(echo "$samples" | wc -w)))" \
   "$(tavrelctl stat show com.norvane.usage.samples --json | python3 -c '
 import json, sys
 days = json.load(sys.stdin)["scalar"]["days"]
-print(*[day["value"] for day in days if day["date"] == "2026-11-22"])')"
+print(*[day["value"] for day in days if day["date"] == "2037-11-22"])')"
 systemctl start tavrel-collect.timer
 expect "no unit failed" "" "$(systemctl list-units --no-legend --plain --state=failed 'tavrel*')"
 note "CPU time of the day: $((day_used / 1000)) ms at an instruction a nanosecond"
