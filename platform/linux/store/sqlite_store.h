@@ -67,8 +67,8 @@ class SqliteStore : public StatisticsStore {
   /// The history with its wider set of queries; without rows when there is no store yet.
   Expected<std::unique_ptr<SqliteHistory>> openHistory();
 
-  /// Removes rows, also those that are kept beside the store, and overwrites what they held. After a
-  /// failure some may be gone.
+  /// Removes rows, also those that are kept beside the store, and overwrites what they held. After
+  /// a failure some may be gone.
   Expected<ErasedRows> erase(const RowRange& range);
 
  private:
