@@ -22,7 +22,7 @@ std::string functionName(const CommandModel& command) {
   return name;
 }
 
-// A text within a specification of _arguments or _describe.
+// A text within an argument of _arguments or _describe.
 std::string plain(std::string_view text) {
   std::string result;
   for (const char character : text) {
@@ -43,8 +43,8 @@ std::string valueText(const CommandModel& command, const OptionModel& option) {
   return text + "{_tavrelctl_list " + std::string(kind) + "}";
 }
 
-std::string specification(const CommandModel& command, const OptionModel& option,
-                          const std::string& name) {
+std::string argumentOf(const CommandModel& command, const OptionModel& option,
+                       const std::string& name) {
   std::string text = "(" + joined(option.names);
   for (const std::string& other : option.excludes)
     text += ' ' + other;
@@ -52,10 +52,10 @@ std::string specification(const CommandModel& command, const OptionModel& option
   return quoted(option.isFlag() ? text : text + valueText(command, option));
 }
 
-void addSpecifications(const CommandModel& command, std::string& script) {
+void addArguments(const CommandModel& command, std::string& script) {
   for (const OptionModel& option : command.options) {
     for (const std::string& name : option.names)
-      script += " \\\n    " + specification(command, option, name);
+      script += " \\\n    " + argumentOf(command, option, name);
   }
 }
 
@@ -64,7 +64,7 @@ void addGroup(const CommandModel& command, std::string& script) {
   for (const CommandModel& below : command.commands)
     script += "    " + quoted(below.name + ":" + plain(below.description)) + '\n';
   script += "  )\n  _arguments -C $root";
-  addSpecifications(command, script);
+  addArguments(command, script);
   script += " \\\n    '1:command:->command' '*::argument:->argument'\n  case $state in\n";
   script += "    command) _describe -t commands command commands ;;\n";
   script += "    argument)\n      case $words[1] in\n";
@@ -84,7 +84,7 @@ void addFunction(const CommandModel& command, std::string& script) {
     addGroup(command, script);
   } else {
     script += "  _arguments $root";
-    addSpecifications(command, script);
+    addArguments(command, script);
     for (const OptionModel& argument : command.arguments) {
       const std::string text = valueText(command, argument);
       script += " \\\n    " + quoted((argument.mayRepeat ? "*" : "") + text);
