@@ -130,7 +130,8 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   expect("WARNING store: ", 1);
   EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
             std::string::npos);
-  device.write("/etc/tavrel/limits.plist", xmlOf(R"({"Store": {"Bytes": 1}})"));
+  device.write("/etc/tavrel/limits.plist", "garbage");
+  EXPECT_NE(device.run("status --check").out.find("limits.plist"), std::string::npos);
   std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);
   std::filesystem::remove(device.path(store + "-wal"));

@@ -24,9 +24,6 @@ constexpr CheckFigureKind kRunTime{"finished_timestamp_seconds",
 constexpr CheckFigureKind kRunErrors{"errors", "tavrel_last_run_errors", "",
                                      "Errors that the last run logged."};
 
-// Integer: the first day whose statistics may leave, in days since 1970.
-constexpr std::string_view kFirstDayKey = "DiagnosticSubmissionFirstDay";
-
 // A run takes seconds; one that still runs after this waits for something.
 constexpr std::int64_t kLongRun = 3600;
 
@@ -85,7 +82,7 @@ void checkPermission(CheckScene& scene) {
   const plist::Value value =
       preferences.ZTXPreferencesGetValue(kSubmissionEnabledKey, kDiagnosticsDomain);
   const plist::Value firstDay =
-      preferences.ZTXPreferencesGetValue(kFirstDayKey, kDiagnosticsDomain);
+      preferences.ZTXPreferencesGetValue(kSubmissionFirstDayKey, kDiagnosticsDomain);
   const bool isAllowed = value.boolean().value_or(false);
   if (scene.context.hasComplaints()) {
     check.state = CheckState::Unknown;
@@ -99,8 +96,8 @@ void checkPermission(CheckScene& scene) {
                           kSubmissionEnabledKey, kindWithArticle(value));
     } else if (isAllowed && !firstDay.isNull() && !firstDay.number()) {
       check.state = CheckState::Warning;
-      check.text =
-          format("%s is %s: set it as an integer", kFirstDayKey, kindWithArticle(firstDay));
+      check.text = format("%s is %s: set it as an integer", kSubmissionFirstDayKey,
+                          kindWithArticle(firstDay));
     } else if (isAllowed && firstDay.number() && firstDay.number()->int64() >= scene.today) {
       check.text += format(", from day %s on", dayText(firstDay.number()->int32()));
     }

@@ -7,7 +7,7 @@
 
 #include "base/format.h"
 #include "platform/linux/files/file_system.h"
-#include "platform/linux/files/property_list_file.h"
+#include "platform/linux/limits/device_limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "tools/check/checks.h"
@@ -35,15 +35,6 @@ void add(Check& check, CheckState state, const std::string& text) {
   check.text += (check.text.empty() ? "" : "; ") + text;
 }
 
-std::optional<double> limitOf(CheckScene& scene) {
-  LinuxPlatform& device = scene.context.linuxPlatform();
-  const auto limits = readDictionaryFile(device.fileSystem(), device.platform().propertyLists,
-                                         device.platform().log,
-                                         scene.context.root().path("/etc/tavrel/limits.plist"));
-  const auto bytes = limits.dictionary("Store").number("Bytes");
-  return bytes ? std::optional(bytes->real()) : std::nullopt;
-}
-
 void checkSize(CheckScene& scene, const std::string& path, Check& check) {
   double size = 0;
   for (const char* ending : {"", "-wal"}) {
@@ -52,9 +43,14 @@ void checkSize(CheckScene& scene, const std::string& path, Check& check) {
   }
   check.figures.push_back({&kSize, size});
   add(check, CheckState::Ok, sizeText(size));
-  const auto limit = limitOf(scene);
-  if (limit && size > *limit + kBeyondLimit) {
-    add(check, CheckState::Warning, "more than the limit of " + sizeText(*limit));
+  LinuxPlatform& device = scene.context.linuxPlatform();
+  const auto limits = DeviceLimits::read(scene.context.root(), device.fileSystem(),
+                                         device.platform().propertyLists);
+  if (!limits) {
+    add(check, CheckState::Warning, limits.error().message);
+  } else if (const auto limit = static_cast<double>(limits->of(Kept::Store).bytes);
+             size > limit + kBeyondLimit) {
+    add(check, CheckState::Warning, "more than the limit of " + sizeText(limit));
   }
   struct statvfs space {};
   if (statvfs(path.c_str(), &space) != 0) return;
