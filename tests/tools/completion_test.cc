@@ -103,6 +103,7 @@ TEST(CompletionTest, CompletesValues) {
   device.fileLog("pending/log-tallied-20261127T180218Z-5f0c9a1e", "x", "{}");
   device.write("/folder/file.log", "");
   const std::pair<std::string, Words> kCases[] = {
+      {"stat show ''", {"com.example.a", "com.example.b"}},
       {"stat show com.", {"com.example.a", "com.example.b"}},
       {"whitelist explain x y com.example.a", {"com.example.a"}},
       {"stat show com.example.a com.", {}},
