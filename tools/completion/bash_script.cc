@@ -65,7 +65,7 @@ complete -F _tavrelctl tavrelctl
 )";
 
 std::string kindOf(const CommandModel& command, const OptionModel& option) {
-  if (!option.choices.empty()) return quoted("words:" + joined(option.choices));
+  if (!option.choices.empty()) return shellQuoted("words:" + joined(option.choices));
   return std::string(valueKind(command, option));
 }
 
@@ -84,7 +84,7 @@ void addCase(const CommandModel& command, std::string& script) {
     arguments.push_back(kindOf(command, argument));
     repeats = argument.mayRepeat;
   }
-  script += "    " + quoted(command.path) + ")\n";
+  script += "    " + shellQuoted(command.path) + ")\n";
   script += "      commands=(" + joined(commands) + ") options=(" + joined(options) + ")\n";
   script += "      values=(" + joined(values) + ") arguments=(" + joined(arguments) +
             ") repeats=" + (repeats ? "1" : "0") + " ;;\n";

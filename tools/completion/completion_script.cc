@@ -16,7 +16,7 @@ std::string_view valueKind(const CommandModel& command, const OptionModel& optio
   return "none";
 }
 
-std::string quoted(std::string_view text, std::string_view escape) {
+std::string shellQuoted(std::string_view text, std::string_view escape) {
   std::string result = "'";
   for (const char character : text) {
     if (character == '\'') {

@@ -17,7 +17,7 @@ std::string zshScript(const CommandModel& program);
 std::string fishScript(const CommandModel& program);
 
 /// `text` in single quotes, with `escape` for a single quote in it.
-std::string quoted(std::string_view text, std::string_view escape = "'\\''");
+std::string shellQuoted(std::string_view text, std::string_view escape = "'\\''");
 
 /// Words with a blank between them.
 std::string joined(const std::vector<std::string>& words);

@@ -48,7 +48,7 @@ std::string fishQuoted(std::string_view text) {
     if (character == '\\') doubled += '\\';
     doubled += character;
   }
-  return quoted(doubled, kQuoteEscape);
+  return shellQuoted(doubled, kQuoteEscape);
 }
 
 // The option of `complete` for values, after the names.

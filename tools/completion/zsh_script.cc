@@ -49,7 +49,7 @@ std::string argumentOf(const CommandModel& command, const OptionModel& option,
   for (const std::string& other : option.excludes)
     text += ' ' + other;
   text += ")" + name + "[" + plain(option.description) + "]";
-  return quoted(option.isFlag() ? text : text + valueText(command, option));
+  return shellQuoted(option.isFlag() ? text : text + valueText(command, option));
 }
 
 void addArguments(const CommandModel& command, std::string& script) {
@@ -62,7 +62,7 @@ void addArguments(const CommandModel& command, std::string& script) {
 void addGroup(const CommandModel& command, std::string& script) {
   script += "  local context state line\n  local -a commands=(\n";
   for (const CommandModel& below : command.commands)
-    script += "    " + quoted(below.name + ":" + plain(below.description)) + '\n';
+    script += "    " + shellQuoted(below.name + ":" + plain(below.description)) + '\n';
   script += "  )\n  _arguments -C $root";
   addArguments(command, script);
   script += " \\\n    '1:command:->command' '*::argument:->argument'\n  case $state in\n";
@@ -87,7 +87,7 @@ void addFunction(const CommandModel& command, std::string& script) {
     addArguments(command, script);
     for (const OptionModel& argument : command.arguments) {
       const std::string text = valueText(command, argument);
-      script += " \\\n    " + quoted((argument.mayRepeat ? "*" : "") + text);
+      script += " \\\n    " + shellQuoted((argument.mayRepeat ? "*" : "") + text);
     }
     script += '\n';
   }
