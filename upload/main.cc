@@ -44,6 +44,8 @@ int upload(SystemLog& log, bool atOnce) {
       readConfiguration(root, files, propertyLists, credentials ? credentials : "");
   if (!configuration) {
     log.write(LogLevel::Error, configuration.error().message);
+    noteFailure({root, files, propertyLists, preferences, clock, log},
+                configuration.error().message);
     return kMisconfigured;
   }
   Uploader uploader({root, files, propertyLists, preferences, clock, log}, *configuration);

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <cmath>
 #include <cstdint>
 #include <cstring>
 #include <fcntl.h>
@@ -48,6 +49,17 @@ Uploader::Uploader(const Services& services, const Configuration& configuration)
       outbox_(services.root, services.files),
       statePath_(services.root.path(kStatePath)) {}
 
+void noteFailure(const Services& services, std::string_view why) {
+  const std::string path = services.root.path(kStatePath);
+  State state = readState(services.files, services.propertyLists, services.log, path);
+  state.failure = why;
+  state.lastFailure = services.clock.now();
+  ++state.failedAttempts;
+  if (Status written = writeState(services.files, services.propertyLists, path, state); !written) {
+    services.log.write(LogLevel::Error, written.error().message);
+  }
+}
+
 Uploader::Permission Uploader::permission() {
   // Read anew: whoever withdraws it is another process.
   services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
@@ -65,7 +77,7 @@ std::chrono::milliseconds Uploader::timeLeft() const {
 
 void Uploader::complain(std::string_view line) {
   services_.log.write(LogLevel::Error, line);
-  hasComplained_ = true;
+  if (complaint_.empty()) complaint_ = line;
 }
 
 Outcome Uploader::run(bool atOnce) {
@@ -85,10 +97,25 @@ Outcome Uploader::run(bool atOnce) {
     complain(systemError("lock", path).message);
     return Outcome::Failed;
   }
-  return runLocked(atOnce);
+  Outcome outcome = runLocked(atOnce);
+  if (!complaint_.empty()) {
+    state_.failure = complaint_;
+    state_.lastFailure = services_.clock.now();
+    ++state_.failedAttempts;
+    outcome = Outcome::Failed;
+  }
+  if (tried_ || !complaint_.empty()) {
+    if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
+        !written) {
+      services_.log.write(LogLevel::Error, written.error().message);
+      outcome = Outcome::Failed;
+    }
+  }
+  return outcome;
 }
 
 Outcome Uploader::runLocked(bool atOnce) {
+  state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted == Permission::NotGiven) return Outcome::Done;
@@ -101,9 +128,8 @@ Outcome Uploader::runLocked(bool atOnce) {
     complain(logs.error().message);
     return Outcome::Failed;
   }
-  if (logs->empty()) return hasComplained_ ? Outcome::Failed : Outcome::Done;
+  if (logs->empty()) return Outcome::Done;
 
-  state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const plist::Date now = services_.clock.now();
   if (!atOnce && mustWait(state_, now)) {
     services_.log.log(LogLevel::Info, "logs wait: the next attempt is not before %s",
@@ -122,14 +148,8 @@ Outcome Uploader::runLocked(bool atOnce) {
     services_.log.log(LogLevel::Default, "logs sent: %llu, refused by the server: %llu",
                       std::uint64_t{sent_}, std::uint64_t{refused_});
   }
-  if (tried_) {
-    state_.lastAttempt = now;
-    if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
-        !written) {
-      complain(written.error().message);
-    }
-  }
-  return hasComplained_ ? Outcome::Failed : outcome;
+  if (tried_) state_.lastAttempt = now;
+  return outcome;
 }
 
 Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
@@ -164,7 +184,7 @@ Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
 
 Uploader::Step Uploader::send(const WaitingLog& log) {
   if (!isPlain(log.name)) {
-    complain(format("cannot send %s: its name is none that the system gives; remove it",
+    complain(format("cannot send %s: it is not named like a log of this system; remove it",
                     percentEncoded(outbox_.logPath(log.name))));
     return Step::Next;
   }
@@ -223,10 +243,12 @@ Uploader::Step Uploader::judge(const WaitingLog& log, const Answer& answer,
         "network?",
         kReceivedHeader);
   } else if (!answer.location.empty()) {
-    why += format(" and points to %s: redirects are not followed; mend URL",
-                  percentEncoded(answer.location.substr(0, 200)));
-  } else if (status == 401 || status == 403) {
-    why += ": check the certificate or the token";
+    why += format(
+        " and points to %s: redirects are not followed; "
+        "correct URL, unless this is a login page of the network",
+        percentEncoded(answer.location.substr(0, 200)));
+  } else if (status == 400 || status == 401 || status == 403) {
+    why += ": check the certificate and the token";
   } else if (status == 404) {
     why += ": check URL";
   }
@@ -272,11 +294,12 @@ Uploader::Step Uploader::fail(const WaitingLog& log, std::string_view why,
   const plist::Date now = services_.clock.now();
   ++state_.failedAttempts;
   state_.lastFailure = now;
-  state_.nextAttempt = plist::Date::sinceEpoch(
-      now.secondsSinceEpoch() + pauseSeconds(state_.failedAttempts, serverWish, chance()));
+  const double next =
+      now.secondsSinceEpoch() + pauseSeconds(state_.failedAttempts, serverWish, chance());
+  state_.nextAttempt = plist::Date::sinceEpoch(next);
   state_.failure = format("cannot send log %s: %s", log.name, why);
   services_.log.log(LogLevel::Error, "%s; next attempt after %s", state_.failure,
-                    isoDateText(*state_.nextAttempt));
+                    isoDateText(plist::Date::sinceEpoch(std::ceil(next))));
   return Step::Stop;
 }
 

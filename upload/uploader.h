@@ -36,6 +36,9 @@ struct Services {
   SystemLog& log;
 };
 
+/// Keeps for `tavrelctl status --check` why a run could not even begin.
+void noteFailure(const Services& services, std::string_view why);
+
 enum class Outcome {
   Done,    // nothing is left to do
   Waits,   // logs wait for a later run
@@ -80,7 +83,7 @@ class Uploader {
   std::size_t sent_ = 0;
   std::size_t refused_ = 0;
   bool tried_ = false;
-  bool hasComplained_ = false;
+  std::string complaint_;  // the first of this run
 };
 
 }  // namespace tavrel::upload

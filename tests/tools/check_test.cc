@@ -58,7 +58,7 @@ struct CheckTest : testing::Test {
 TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
   writeRun(kHour, true);
   device.check("status --check",
-               prints("OK permission: the daily log may not leave\n"
+               prints("OK permission: the daily log may not leave the device\n"
                       "OK clock: today is day " +
                       std::to_string(today()) + " (" + isoAgo(0).substr(0, 10) +
                       ")\n"
@@ -98,7 +98,7 @@ TEST_F(CheckTest, TellsHowTheLastRunsWent) {
   writeRun(7 * kDay + 60, true);
   expect("CRITICAL " + run + " finished", 2);
   writeRun(kHour, true, 2);
-  expect("WARNING " + run + " finished, begun 5 h ago; 2 errors: cannot do 0: cannot do 1\n", 1);
+  expect("WARNING " + run + " finished, begun 5 h ago; 2 errors: cannot do 0; cannot do 1\n", 1);
 }
 
 TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
@@ -171,7 +171,7 @@ TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
   state(8 * kDay, 4);
   expect("CRITICAL upload: ", 2);
   device.write("/var/lib/tavrel/upload/state.plist", xmlOf(R"({"FailedAttempts": 1})"));
-  expect("WARNING upload: never sent; 1 attempt failed since: reason unknown\n", 1);
+  expect("WARNING upload: never sent; 1 attempt failed, the last with: reason unknown\n", 1);
   device.run("stat import -",
              "scalar\tyesterday\tcom.norvane.tavrel.limits.store.days\t3\n"
              "scalar\ttoday\tcom.norvane.brimhold.dropped\t0\n"

@@ -88,7 +88,7 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
   EXPECT_EQ(device.json("status")["submission_first_day"], nullptr);
   device.check("allow", prints("submission is already allowed\n"));
   for (const auto& [key, value, wrong, right] :
-       {std::array{kSwitch.c_str(), "yes", "a boolean, not \"yes\"", "true --bool"},
+       {std::array{kSwitch.c_str(), "yes", "a boolean, not \"yes\"", ""},
         {"com.norvane.NANDInfo userWAmp", "10 --int", "a number above 0 and below 10, not 10",
          "2.5 --float"},
         {"com.norvane.da AggressiveSubmissionDays", "1.5 --float", "an integer, not 1.5",
@@ -98,8 +98,10 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
     const std::string set = "prefs set " + name + " " + value;
     device.check(
         set, fails("preference " + name.substr(space + 1) + " of domain " + name.substr(0, space) +
-                       " is " + wrong + ": give 'tavrelctl prefs set " + name + " " + right +
-                       "', or store it all the same with --force",
+                       " is " + wrong + ": " +
+                       (*right == 0 ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
+                                    : "give 'tavrelctl prefs set " + name + " " + right + "'") +
+                       ", or store it all the same with --force",
                    2));
     EXPECT_EQ(device.run(set + " --force").status, 0);
   }
@@ -168,7 +170,7 @@ TEST_F(Consent, ErasesDaysOrAll) {
   device.check("erase --yes --from 20001 --to 20001",
                {0, "erased: 1 scalar, 1 distribution of 1 value, 1 file of records\n",
                 "tavrelctl: 2 waiting logs may report what was erased: 'tavrelctl deny' deletes "
-                "them\n"});
+                "what waits, and withdraws the permission\n"});
   EXPECT_TRUE(fs::exists(device.path(records + "4.jsonl")));
   device.check("erase --yes --all", prints("erased: 1 scalar, 0 distributions of 0 values, 1 file "
                                            "of records, 3 logs, 1 damaged file\n"));

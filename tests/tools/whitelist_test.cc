@@ -171,7 +171,7 @@ gets coarser (3)
   device.check({"whitelist", "diff", before, absent},
                fails("cannot read " + absent + ": No such file or directory", 2));
   device.check({"whitelist", "diff", "-", after},
-               fails("standard input: it is no whitelist, which is a dictionary of groups", 2),
+               fails("standard input: not a whitelist: its root must be a dictionary of groups", 2),
                xmlOf("[]"));
 }
 

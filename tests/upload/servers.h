@@ -78,7 +78,7 @@ class Nginx {
     signed="-CA ca.crt -CAkey ca.key"
     make ca -subj /CN=ca && cp ca.crt devices-authority.crt && make other -subj /CN=ca &&
       make server -subj /CN=s $signed -addext subjectAltName=IP:127.0.0.1 &&
-      make device -subj /O=Example/CN=device-7 $signed &&
+      make device -subj /CN=device-7/O=Example,CN=other $signed &&
       exec nginx -p "$0" -c nginx.conf -e error.log)";
   void end() {
     if (process == 0) return;

@@ -26,7 +26,8 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
   device.add(nameOf(5), "pending/", "4\r\nEvil: 1 \xC3\xA9 100%");
   device.write(kOutbox + nameOf(9) + ".metadata.plist", "its log is gone");
   const std::tuple<std::string, const char*, const char*, std::string> faults[] = {
-      {server, "ca", "", nameOf(3) + ": the server answers 400; next attempt"},
+      {server, "ca", "",
+       nameOf(3) + ": the server answers 400: check the certificate and the token; next attempt"},
       {server, "ca", "other", "the server answers 400"},
       {server, "other", "device", "SSL certificate problem"},
       {format("https://localhost:%d/logs", nginx.port), "ca", "device",
@@ -78,10 +79,11 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
       {"201 Created\r\nTavrel-Received: sha-256=:bw==:\r\n", ends + "201" + portal, 300, 600},
       {"202 Accepted\r\n" + received, ends + "202", 300, 600},
       {"302 Found\r\nLocation: http://portal.example/\r\n",
-       ends + "302 and points to http://portal.example/: redirects are not followed; mend URL", 300,
-       600},
-      {"401 No\r\n", ends + "401: check the certificate or the token", 300, 600},
-      {"403 No\r\n", ends + "403: check the certificate or the token", 300, 600},
+       ends + "302 and points to http://portal.example/: redirects are not followed; "
+              "correct URL, unless this is a login page of the network",
+       300, 600},
+      {"401 No\r\n", ends + "401: check the certificate and the token", 300, 600},
+      {"403 No\r\n", ends + "403: check the certificate and the token", 300, 600},
       {busy + "7200\r\n", ends + "503", 7200, 7920},
       {busy + "Fri, 31 Dec 9999 23:59:59 GMT\r\n", ends + "503", 21'599, 86'400},
       {busy + "99999999999999999999\r\n", ends + "503", 300, 86'400},
@@ -204,7 +206,8 @@ TEST(Upload, LosesNoLogThatChangesMeanwhile) {
   });
   EXPECT_EQ(device.runAgainst(server), Outcome::Failed);
   EXPECT_TRUE(device.log.says("log " + nameOf(1) + " was changed while it was sent"));
-  EXPECT_TRUE(device.log.says("other name.log: its name is none that the system gives; remove it"));
+  EXPECT_TRUE(
+      device.log.says("other name.log: it is not named like a log of this system; remove it"));
   EXPECT_EQ(device.names(), Lines{"other name.log"}) << "the changed one was sent by another pass";
   EXPECT_EQ(requests, 5);
 

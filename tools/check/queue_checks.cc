@@ -91,9 +91,9 @@ void judgeUpload(CheckScene& scene, const plist::Dictionary& state, Check& check
   if (!failed || failed->int64() <= 0) return;
   // Without a success it has never worked.
   check.state = success ? stateOfAge(scene.ageOf(*success)) : CheckState::Warning;
-  check.text += format("; %s failed since: %s",
-                       counted(static_cast<std::uint64_t>(failed->int64()), "attempt"),
-                       state.string("Failure").value_or("reason unknown"));
+  check.text += format(
+      "; %s failed%s: %s", counted(static_cast<std::uint64_t>(failed->int64()), "attempt"),
+      success ? " since" : ", the last with", state.string("Failure").value_or("reason unknown"));
 }
 
 }  // namespace

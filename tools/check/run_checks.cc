@@ -55,7 +55,7 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
     check.state = graver(check.state, CheckState::Warning);
     check.text += format("; %s", counted(static_cast<std::uint64_t>(run.errorCount), "error"));
     for (const std::string& error : run.errors)
-      check.text += ": " + error;
+      check.text += (&error == run.errors.data() ? ": " : "; ") + error;
   }
   return check;
 }
@@ -89,7 +89,8 @@ void checkPermission(CheckScene& scene) {
     check.text = "preferences cannot be read";
   } else {
     check.figures.push_back({&kAllowed, isAllowed ? 1.0 : 0.0});
-    check.text = isAllowed ? "the daily log may leave the device" : "the daily log may not leave";
+    check.text =
+        isAllowed ? "the daily log may leave the device" : "the daily log may not leave the device";
     if (!value.isNull() && !value.boolean()) {
       check.state = CheckState::Warning;
       check.text = format("%s is %s, which counts as no: set it as a boolean",
@@ -136,6 +137,10 @@ void checkLastLog(CheckScene& scene) {
   Check check{"last-log"};
   check.state = conclusion.outcome ? stateOf(*conclusion.outcome) : CheckState::Unknown;
   check.text = (conclusion.isOfNextRun ? "the next run: " : "the last run: ") + conclusion.text();
+  if (scene.context.hasComplaints()) {
+    check.state = CheckState::Unknown;
+    check.text = "preferences cannot be read";
+  }
   scene.checks.push_back(std::move(check));
 }
 

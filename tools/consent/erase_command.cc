@@ -134,11 +134,12 @@ bool isSetAside(const std::string& name, const std::string& store) {
   return name.starts_with(store + ".corrupt-") || name == store + "-kept-damaged";
 }
 
-/// Everything in turn; a failure ends it, and the next call does the rest. Logs go last: a run that
-/// begins when the rows are gone makes none of them.
+/// Everything in turn; a failure ends it, and the next call does the rest. Only what cannot be
+/// folded keeps nothing else. Logs go last: a run that begins when the rows are gone makes none of
+/// them.
 Status erase(ToolContext& context, const Scope& scope, Erased& erased) {
   LinuxPlatform& device = context.linuxPlatform();
-  if (Status folded = foldEverything(context); !folded) return folded;
+  const Status folded = foldEverything(context);
   const auto rows = device.store().erase(scope.rows);
   if (!rows) return rows.error();
   erased.rows = *rows;
@@ -162,7 +163,7 @@ Status erase(ToolContext& context, const Scope& scope, Erased& erased) {
     erased.logs = removed.logs;
     if (removed.failure) return *removed.failure;
   }
-  return Done{};
+  return folded;
 }
 
 void print(ToolContext& context, const Scope& scope, const Erased& erased) {
@@ -191,7 +192,8 @@ void print(ToolContext& context, const Scope& scope, const Erased& erased) {
   out << '\n';
 }
 
-void noteWhatStays(ToolContext& context, const Scope& scope, const ErasedRows& rows) {
+void noteWhatStays(ToolContext& context, const Scope& scope, const Erased& erased) {
+  const ErasedRows& rows = erased.rows;
   if (!rows.isLogEmpty) {
     context.fail(
         "another process uses the store: its write-ahead log still has what was erased: run it "
@@ -210,6 +212,7 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const ErasedRows& r
                "'tavrelctl erase --all' removes them",
                counted(rows.damaged, "distribution")));
   }
+  if (rows.scalars + rows.distributions == 0) return;
   FileSubmission& submission = context.linuxPlatform().submission();
   std::size_t logs = 0;
   using enum FileSubmission::Place;
@@ -218,9 +221,16 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const ErasedRows& r
     logs += found ? *found : 0;
   }
   if (logs > 0) {
-    context.note(format("%s may report what was erased: 'tavrelctl deny' deletes them",
-                        counted(std::uint64_t{logs}, "waiting log")));
+    context.note(
+        format("%s may report what was erased: 'tavrelctl deny' deletes what waits, and withdraws "
+               "the permission",
+               counted(std::uint64_t{logs}, "waiting log")));
   }
+}
+
+// An empty variable of a script must not mean all days.
+std::string namesADay(const std::string& text) {
+  return text.empty() ? "names no day" : "";
 }
 
 void run(ToolContext& context, const Arguments& arguments) {
@@ -232,7 +242,7 @@ void run(ToolContext& context, const Arguments& arguments) {
     return context.fail(format("not everything is erased: %s; run it again", done.error().message));
   }
   print(context, *scope, erased);
-  noteWhatStays(context, *scope, erased.rows);
+  noteWhatStays(context, *scope, erased);
 }
 
 }  // namespace
@@ -251,8 +261,9 @@ void addEraseCommand(Command app, ToolContext& context) {
   command
       .addOption("--from", arguments->from,
                  "The first day: today, yesterday, a number or YYYY-MM-DD, UTC")
-      .typeName("DAY");
-  command.addOption("--to", arguments->to, "The last day").typeName("DAY");
+      .typeName("DAY")
+      .check(namesADay);
+  command.addOption("--to", arguments->to, "The last day").typeName("DAY").check(namesADay);
   command.addFlag("--yes", arguments->yes, "Do not ask");
   command.setFooter(
       "Without --key, the files of structured records of the days go, too. Preferences stay. See\n"

@@ -147,7 +147,7 @@ void deny(ToolContext& context) {
                   << "; " << counted(std::uint64_t{removed.logs}, "waiting log") << " deleted\n";
   }
   if (!isStored) {
-    context.fail("the withdrawal could not be written: mend what is said above and run it again");
+    context.fail("the withdrawal is not stored: solve the problem above, then run it again");
   }
   if (removed.failure) {
     context.fail(format("logs still wait: %s%s", removed.failure->message,
@@ -165,7 +165,10 @@ void addAllowCommand(Command app, ToolContext& context) {
       .addOption("--from", arguments->from,
                  "The first day whose statistics may leave: today, yesterday, a number or "
                  "YYYY-MM-DD, UTC")
-      .typeName("DAY");
+      .typeName("DAY")
+      .check([](const std::string& text) {
+        return text.empty() ? std::string("names no day") : std::string();
+      });
   command.setFooter(
       "Nothing that was recorded before leaves the device, unless --from names an earlier day. "
       "See\n"

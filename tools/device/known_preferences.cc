@@ -25,7 +25,7 @@ bool isAmplification(const plist::Value& value) {
   return number && number->real() > 0 && number->real() < 10;
 }
 
-constexpr Form kBoolean{"a boolean", "true --bool",
+constexpr Form kBoolean{"a boolean", "true|false --bool",
                         [](const plist::Value& value) { return value.boolean().has_value(); }};
 constexpr Form kInteger{"an integer", "3 --int", isInteger};
 constexpr Form kString{"a string", "TEXT --string",
@@ -70,11 +70,14 @@ std::string faultOfPreference(std::string_view domain, std::string_view key,
       [&](const KnownPreference& entry) { return entry.domain == domain && entry.key == key; });
   if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
   const bool isLong = value.dictionary() || value.array() || value.data();
+  // No example whose copy would give the permission.
+  const bool isPermission = known->key.starts_with("DiagnosticSubmission");
+  const std::string cure = isPermission ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
+                                        : format("give 'tavrelctl prefs set %s %s %s'", domain, key,
+                                                 known->form.example);
   return format(
-      "preference %s of domain %s is %s, not %s: give 'tavrelctl prefs set %s %s %s', or "
-      "store it all the same with --force",
-      key, domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value), domain,
-      key, known->form.example);
+      "preference %s of domain %s is %s, not %s: %s, or store it all the same with --force", key,
+      domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value), cure);
 }
 
 }  // namespace tavrel

@@ -69,6 +69,14 @@ void store(ToolContext& context, const Arguments& arguments, const plist::Value&
   if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionEnabledKey) {
     forgetFirstDay(context, value);
   }
+  const bool wasGiven = submissionPermission(preferences).isGiven;
+  const auto before = preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain).number();
+  if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionFirstDayKey &&
+      wasGiven && before && (!value.number() || value.number()->int64() < before->int64())) {
+    context.note(
+        "what was recorded earlier may leave now, too: 'tavrelctl deny', then 'tavrelctl allow', "
+        "begins with the next day");
+  }
   preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
   if (!preferences.ZTXPreferencesSynchronize(arguments.domain) ||
       preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain) != value) {

@@ -80,7 +80,7 @@ void diff(ToolContext& context, const Arguments& arguments) {
     if (!whitelist) return context.failUsage(whitelist.error().message);
     if (!whitelist->value.dictionary()) {
       return context.failUsage(
-          format("%s: it is no whitelist, which is a dictionary of groups", whitelist->name));
+          format("%s: not a whitelist: its root must be a dictionary of groups", whitelist->name));
     }
     both.push_back(*std::move(whitelist));
   }
