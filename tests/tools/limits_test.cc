@@ -62,7 +62,8 @@ TEST(Limits, AKillAtAnyMomentLosesNothingThatStays) {
       device.fileLog(format("pending/log-tallied-%sT000000Z-00000001", day), "L", "{}");
     killed = runUntilSystemCall(calls, [&] { device.run("tidy"); });
 
-    for (const auto& log : device.json("log list")["logs"])
+    const auto logs = device.json("log list");
+    for (const auto& log : logs["logs"])
       EXPECT_NE(log["metadata"], nlohmann::json::object()) << log;
     EXPECT_EQ(device.run("stat export").status, 0) << "each distribution has its values";
     EXPECT_EQ(device.run("tidy").status, 0);

@@ -22,11 +22,12 @@ double secondOf(const FiledLog& log) {
   return time ? std::floor(time->secondsSince1970()) : -HUGE_VAL;
 }
 
-// The order in which logs were filed. Metadata tells the second, the file the rest.
+// The order in which logs were filed. Metadata tells the second, the file the rest; the clock of a
+// file system has steps, within which names decide.
 bool isOlder(const FiledLog& a, const FiledLog& b) {
   const auto order = [](const FiledLog& log) {
     const timespec modified = log.status ? log.status->st_mtim : timespec{};
-    return std::tuple(secondOf(log), modified.tv_sec, modified.tv_nsec);
+    return std::tuple(secondOf(log), modified.tv_sec, modified.tv_nsec, std::string_view(log.name));
   };
   return order(a) < order(b);
 }
