@@ -35,7 +35,7 @@ class Outbox {
 
   /// Moves what waits in pending/ to the outbox, as long as `mayMove` says so, which is asked for
   /// each log while nobody else can move it. A log that cannot be moved does not keep others; the
-  /// first failure is told.
+  /// first failure is reported.
   Status takePending(const std::function<bool()>& mayMove);
 
   /// Removes a log of the outbox. One that is gone already is fine.

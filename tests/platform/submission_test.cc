@@ -263,6 +263,11 @@ TEST(Submission, FilesNothingWhenThePermissionGoesMeanwhile) {
       "193", "log-tallied", {}, [&](LogFile&) { permit(device, false); }));
   EXPECT_EQ(service.log.lines.back(),
             "cannot file log \"log-tallied\": submission is no longer allowed");
+  permit(device, true);
+  service.readRowsOf(kToday - 1);
+  EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission("193", "log-tallied", {}, [&](LogFile&) {
+    permit(device, true, kToday + 1);
+  })) << "withdrawn and given again";
   EXPECT_EQ(filesPending(device), 0);
 }
 

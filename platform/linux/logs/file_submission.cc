@@ -62,7 +62,7 @@ std::int32_t FileSubmission::today() const {
 }
 
 // Gated and forced runs report the day before. A run that reports its own, unfinished day gets the
-// same answer, and one that is told an older day is refused when it files its log.
+// same answer, and one that names an older day is refused when it files its log.
 bool FileSubmission::isDiagnosticSubmissionEnabled() {
   services_.reportedDays.takeEarliest();
   const SubmissionPermission permission = submissionPermission(services_.preferences);
@@ -117,19 +117,27 @@ bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::str
   return static_cast<bool>(filed);
 }
 
-Expected<FileSubmission::Place> FileSubmission::placeOfNewLog() {
+Expected<FileSubmission::Destination> FileSubmission::destinationOfNewLog() {
   const auto statisticsDay = services_.reportedDays.takeEarliest();
+  const std::int64_t day = statisticsDay.value_or(today());
   const SubmissionPermission permission = submissionPermission(services_.preferences);
-  if (permission.covers(statisticsDay.value_or(today()))) return Place::Pending;
-  if (!statisticsDay) return Place::Withheld;
+  if (permission.covers(day)) return Destination{Place::Pending, day};
+  if (!statisticsDay) return Destination{Place::Withheld, day};
   return Error{format("it holds statistics of day %lld (%s), and submission is %s", *statisticsDay,
                       dateText(civilFromDays(*statisticsDay)), textOf(permission))};
 }
 
+Expected<FileSubmission::Place> FileSubmission::placeOfNewLog() {
+  const auto destination = destinationOfNewLog();
+  if (!destination) return destination.error();
+  return destination->place;
+}
+
 Status FileSubmission::fileLog(std::string_view logType, std::string_view logName,
                                const plist::Dictionary& options, const LogWriter& writer) {
-  const auto place = placeOfNewLog();
-  if (!place) return place.error();
+  const auto destination = destinationOfNewLog();
+  if (!destination) return destination.error();
+  const Place place = destination->place;
   const plist::Date now = services_.clock.now();
   plist::Dictionary metadata{{kLogMetadataType, logType},
                              {kLogMetadataName, logName},
@@ -139,27 +147,31 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
   const auto metadataBytes = services_.propertyLists.encodeXml(metadata);
   if (!metadataBytes) return metadataBytes.error();
 
-  if (*place == Place::Withheld) {
-    if (Status made = files_.makePrivateFolder(folder(*place)); !made) return made;
+  if (place == Place::Withheld) {
+    if (Status made = files_.makePrivateFolder(folder(place)); !made) return made;
   }
   const std::string name = newLogFileName(logName, now);
-  Expected<NewFile> file = files_.create(join(folder(*place), name, kLogEnding),
-                                         *place == Place::Withheld ? kWithheldMode : kMode);
+  Expected<NewFile> file = files_.create(join(folder(place), name, kLogEnding),
+                                         place == Place::Withheld ? kWithheldMode : kMode);
   if (!file) return file.error();
   SubmittedFile handle(*file);
   writer(handle);
   if (!handle.status()) return handle.status();
   if (Status flushed = file->flush(); !flushed) return flushed;
-  return commit(*file, *place, name, *metadataBytes);
+  return commit(*file, *destination, name, *metadataBytes);
 }
 
-Status FileSubmission::commit(NewFile& file, Place place, const std::string& name,
-                              const std::string& metadata) {
+Status FileSubmission::commit(NewFile& file, const Destination& destination,
+                              const std::string& name, const std::string& metadata) {
+  const Place place = destination.place;
   const bool isWithheld = place == Place::Withheld;
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return lock.error();
   if (!isWithheld) {
-    if (Status permitted = checkPermission(); !permitted) return permitted;
+    // Another permission than the one that the log was begun under may cover later days only.
+    const auto stored = storedSubmissionPermission(services_.filePreferences);
+    if (!stored) return stored.error();
+    if (!stored->covers(destination.day)) return Error{"submission is no longer allowed"};
   }
   const std::string metadataPath = join(folder(place), name, kLogMetadataEnding);
   Status done = files_.replace(metadataPath, asBytes(metadata), isWithheld ? kWithheldMode : kMode);

@@ -104,6 +104,10 @@ class FileSubmission final : public SubmissionService {
   Expected<std::vector<FiledLog>> logs(Place place);
 
  private:
+  struct Destination {
+    Place place;
+    std::int64_t day;  // that the permission must cover
+  };
   struct Files {
     std::size_t logs = 0;
     std::size_t metadata = 0;
@@ -112,10 +116,12 @@ class FileSubmission final : public SubmissionService {
   std::string folder(Place place) const;
   std::int32_t today() const;
   Expected<Files> countFiles(Place place) const;
+  Expected<Destination> destinationOfNewLog();
   Status fileLog(std::string_view logType, std::string_view logName,
                  const plist::Dictionary& options, const LogWriter& writer);
   /// Puts a written log in place, if it may still go there.
-  Status commit(NewFile& file, Place place, const std::string& name, const std::string& metadata);
+  Status commit(NewFile& file, const Destination& destination, const std::string& name,
+                const std::string& metadata);
   Status moveToOutbox(const std::string& name);
   void removeOldMetadata(Place place, const std::string& freshMetadata);
   /// An error when storage does not have the owner's permission.

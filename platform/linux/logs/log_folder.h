@@ -28,7 +28,7 @@ struct RemovedLogs {
 
 /// Deletes all logs of the folders, what is left of others, and what is being written. Links are
 /// deleted, not what they name. Each log goes before its metadata. A log that cannot be deleted
-/// does not keep others; the first failure is told.
+/// does not keep others; the first failure is reported.
 RemovedLogs removeLogsIn(FileSystem& files, const std::vector<std::string>& folders);
 
 /// Deletes all but the newest `count` logs of a folder, by the stamps in their names. The one named
