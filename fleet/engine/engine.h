@@ -1,0 +1,102 @@
+// Where the fleet's logs are kept: tables in a database, filled with records and read as rows.
+//
+// An engine stores and finds; it does no floating-point arithmetic, so that what is computed from
+// its rows has the same bits on each engine. Every operation throws EngineError when the database
+// cannot do it; what was appended before stays.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <span>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "fleet/model/log_record.h"
+
+namespace tavrel::fleet {
+
+/// Its text is one line: what failed, where, and what to do.
+class EngineError : public std::runtime_error {
+ public:
+  using std::runtime_error::runtime_error;
+};
+
+/// Names a log within one database. Not the same in another one.
+using LogId = std::uint64_t;
+
+/// Texts are valid during the call that hands the row out.
+struct LogRow {
+  LogId log = 0;
+  std::int32_t day = 0;
+  std::int64_t created = 0;
+  std::string_view osVersion;
+  std::string_view previousOsVersion;
+  std::string_view configNumber;
+  std::string_view whitelistDigest;
+  std::string_view taskID;
+  std::string_view language;
+  std::string_view preferredLanguage;
+  std::string_view region;
+};
+
+struct ScalarValue {
+  LogId log = 0;
+  std::int64_t value = 0;
+};
+
+struct DistributionValue {
+  LogId log = 0;
+  FiveNumbers numbers;
+};
+
+struct CellValue {
+  LogId log = 0;
+  double lower = 0;
+  double upper = 0;
+  std::uint64_t count = 0;
+};
+
+enum class KeyKind : std::uint8_t { kScalar, kDistribution, kHistogram };
+
+struct Key {
+  std::string name;
+  KeyKind kind = KeyKind::kScalar;
+};
+
+/// Rows come in blocks, in no particular order, each row once.
+template <class Row>
+using Visitor = std::function<void(std::span<const Row>)>;
+
+class Engine {
+ public:
+  virtual ~Engine() = default;
+
+  struct Appended {
+    std::size_t added = 0;
+    std::size_t known = 0;  ///< logs that were there before, or twice among the records
+  };
+
+  /// Files all records in one step: after a kill at any moment each of them is there whole or not
+  /// at all. Several loaders may append at once; a log that two of them bring counts once.
+  virtual Appended append(std::span<const LogRecord> records) = 0;
+
+  /// The logs of the days from `firstDay` to `lastDay`, both included.
+  virtual void logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) = 0;
+
+  /// All keys that have rows, in the order of kind and name.
+  virtual std::vector<Key> keys() = 0;
+
+  // The rows of one key, of all days. A key without rows has none.
+  virtual void scalars(std::string_view key, const Visitor<ScalarValue>& visit) = 0;
+  virtual void distributions(std::string_view key, const Visitor<DistributionValue>& visit) = 0;
+  virtual void cells(std::string_view key, const Visitor<CellValue>& visit) = 0;
+
+  /// Another connection to the same tables, for a second thread.
+  virtual std::unique_ptr<Engine> reader() = 0;
+};
+
+}  // namespace tavrel::fleet
