@@ -1,0 +1,223 @@
+#!/usr/bin/env python3
+"""The same duty for four monitors at the same time; script/compare runs it.
+
+    bench/compare.py BIN_DIRECTORY PACKAGES SECONDS
+
+PACKAGES holds the unpacked packages; they are laid over /usr, /etc and /var in this process' mount
+namespace. CPU time is what the kernel gives for each process at its end, so its start counts; memory is the
+peak of what stays running, added up; what a program wrote is what reached the block device of its own file system.
+"""
+
+import contextlib
+import json
+import os
+import pathlib
+import re
+import signal
+import subprocess
+import sys
+import tempfile
+import time
+import urllib.request
+
+from flash import BlockDevice
+
+EXPORTER = "127.0.0.1:9197"
+PMCD_PORT = "44397"
+NAMESPACE = "/var/lib/pcp/pmns"
+
+
+class Duty:
+    """The processes of one monitor, and the disk on which it keeps what it reads."""
+
+    def __init__(self, name, disk):
+        self.name = name
+        self.disk = disk
+        self.folder = pathlib.Path(disk.mounted)
+        self.running = []
+        self.seconds = 0.0
+        self.memory = 0
+        self.values = 0
+        self.written = disk.written()
+
+    def start(self, *command, environment=None):
+        with open(self.folder.parent / "output", "ab") as output:
+            self.running.append(subprocess.Popen(
+                [str(word) for word in command], env={**os.environ, **(environment or {})},
+                stdout=output, stderr=output))
+
+    def stop(self):
+        for process in reversed(self.running):
+            # Not the peak that wait4 gives: it includes this program before the exec.
+            status = pathlib.Path(f"/proc/{process.pid}/status").read_text(encoding="ascii")
+            self.memory += int(re.search(r"VmHWM:\s+(\d+)", status)[1])
+            process.send_signal(signal.SIGTERM)
+            _, _, usage = os.wait4(process.pid, 0)
+            process.returncode = 0
+            self.seconds += usage.ru_utime + usage.ru_stime
+        self.running = []
+
+    def run(self, *command, environment=None):
+        """A program that ends by itself, counted as well."""
+        self.start(*command, environment=environment)
+        process = self.running.pop()
+        _, status, usage = os.wait4(process.pid, 0)
+        process.returncode = 0
+        if status != 0:
+            sys.exit(f"{command[0]} ended with {status}: see {self.folder.parent}/output")
+        self.seconds += usage.ru_utime + usage.ru_stime
+
+
+def lay_over(packages):
+    for top in ["usr", "etc", "var"]:
+        layer = tempfile.mkdtemp(prefix="compare.", dir="/dev/shm")
+        os.mkdir(f"{layer}/upper")
+        os.mkdir(f"{layer}/work")
+        (packages / top).mkdir(exist_ok=True)
+        subprocess.run(["mount", "-t", "overlay", "overlay", f"/{top}", "-o",
+                        f"lowerdir={packages / top}:/{top},upperdir={layer}/upper,"
+                        f"workdir={layer}/work"], check=True)
+
+
+def text(command):
+    return subprocess.run([str(word) for word in command], check=True, capture_output=True,
+                          text=True, env={**os.environ, "PMCD_PORT": PMCD_PORT}).stdout
+
+
+def start_collectd(duty):
+    plugins = ["cpu", "load", "memory", "swap", "disk", "interface", "df", "thermal", "uptime"]
+    configuration = duty.folder.parent / "collectd.conf"
+    configuration.write_text(
+        f'BaseDir "{duty.folder}"\nPIDFile "{duty.folder.parent}/pid"\nInterval 1\n'
+        'TypesDB "/usr/share/collectd/types.db"\n'
+        + "".join(f"LoadPlugin {plugin}\n" for plugin in ["csv", *plugins])
+        + f'<Plugin csv>\n  DataDir "{duty.folder}/csv"\n</Plugin>\n'
+        '<Plugin df>\n  MountPoint "/"\n</Plugin>\n', encoding="ascii")
+    duty.start("/usr/sbin/collectd", "-f", "-C", configuration)
+
+
+def count_collectd(duty):
+    for path in duty.folder.glob("csv/**/*-20??-??-??"):
+        lines = path.read_text(encoding="ascii").splitlines()
+        duty.values += (len(lines) - 1) * lines[0].count(",")
+
+
+def start_exporter(duty):
+    collectors = ["cpu", "loadavg", "meminfo", "diskstats", "netdev", "filesystem",
+                  "thermal_zone", "uname", "time"]
+    duty.start("/usr/bin/prometheus-node-exporter", "--collector.disable-defaults",
+               *[f"--collector.{collector}" for collector in collectors],
+               "--web.disable-exporter-metrics", f"--web.listen-address={EXPORTER}")
+
+
+def scrape(duty):
+    with urllib.request.urlopen(f"http://{EXPORTER}/metrics") as answer:
+        duty.values += sum(1 for line in answer if line[:1] not in (b"#", b"\n"))
+
+
+def start_pcp(duty):
+    pmns = pathlib.Path(NAMESPACE)
+    (pmns / "stdpmid").write_text(
+        (pmns / "stdpmid.pcp").read_text() + (pmns / "stdpmid.local").read_text())
+    subprocess.run(["/usr/lib/pcp/bin/pmnsmerge", "-a", "-f", "root_root", "root_pmcd",
+                    "root_linux", "root"], cwd=pmns, check=True)
+    os.makedirs("/run/pcp", exist_ok=True)
+    agents = duty.folder.parent / "pmcd.conf"
+    agents.write_text("linux 60 dso linux_init /var/lib/pcp/pmdas/linux/pmda_linux.so\n")
+    duty.start("/usr/lib/pcp/bin/pmcd", "-f", "-A", "-n", pmns / "root", "-c", agents, "-l",
+               duty.folder.parent / "pmcd.log", "-s", duty.folder.parent / "socket", "-U", "root",
+               environment={"PMCD_PORT": PMCD_PORT})
+    until("pmcd does not answer", lambda: succeeds(
+        ["pminfo", "-h", "127.0.0.1", "-f", "kernel.all.load"], PMCD_PORT=PMCD_PORT))
+    metrics = ["kernel.percpu.cpu", "kernel.all.load", "kernel.all.uptime", "mem.util", "swap",
+               "disk.dev", "network.interface.in", "network.interface.out", "filesys"]
+    wanted = duty.folder.parent / "pmlogger.conf"
+    wanted.write_text("log mandatory on 1 sec {\n"
+                      + "".join(f"  {metric}\n" for metric in metrics) + "}\n")
+    duty.start("pmlogger", "-h", "127.0.0.1", "-c", wanted, "-l", duty.folder.parent / "log", "-U",
+               "root", duty.folder / "archive", environment={"PMCD_PORT": PMCD_PORT})
+
+
+def count_pcp(duty):
+    # A line of a record of results ends with its count; each is one metric with its instances.
+    for line in text(["pmdumplog", duty.folder / "archive"]).splitlines():
+        if re.match(r"\s+(inst \[.*\] value|60\.\S+ \(\S+\): .*\bvalue)", line):
+            duty.values += 1
+
+
+def start_tavrel(duty, programs, seconds):
+    # Recording is in memory, below the device's root.
+    run = tempfile.mkdtemp(prefix="compare.", dir="/dev/shm")
+    os.makedirs(f"{run}/tavrel/stat")
+    os.symlink(run, duty.folder / "run")
+    duty.start(programs / "tavrelctl", "stat", "collect", "--seconds", seconds + 60,
+               environment={"TAVREL_ROOT": str(duty.folder)})
+
+
+def finish_tavrel(duty, programs):
+    """What else belongs to it: the hourly fold and the daily run."""
+    environment = {"TAVREL_ROOT": str(duty.folder)}
+    duty.run(programs / "tavrelctl", "stat", "fold", environment=environment)
+    duty.run(programs / "tavrel", environment=environment)
+
+
+def count_tavrel(duty, programs):
+    """Each value of a distribution; a scalar for each sample, but for the processes, which are
+    counted once a minute."""
+    statistics = json.loads(text([programs / "tavrelctl", "--root", duty.folder, "stat", "list",
+                                  "com.norvane.usage.", "--json"]))
+    scalars = {row["key"].rsplit(".usage.")[1]: row["value"] for row in statistics["scalars"]}
+    duty.values = scalars["samples"] * (len(scalars) - ("processes" in scalars))
+    duty.values += sum(row["count"] for row in statistics["distributions"])
+
+
+def succeeds(command, **environment):
+    return subprocess.run(command, env={**os.environ, **environment}, capture_output=True,
+                          check=False).returncode == 0
+
+
+def until(what, answer):
+    deadline = time.monotonic() + 30
+    while not answer():
+        if time.monotonic() > deadline:
+            sys.exit(what)
+        time.sleep(0.05)
+
+
+def main(programs, packages, seconds):
+    lay_over(packages)
+    with contextlib.ExitStack() as stack:
+        duties = []
+        for name in ["collectd", "node_exporter", "PCP", "tavrel"]:
+            device = BlockDevice()
+            disk = stack.enter_context(device)
+            if disk is None:
+                sys.exit(f"script/compare: no disk for {name}: {device.reason}")
+            duties.append(Duty(name, disk))
+        collectd, exporter, pcp, tavrel = duties
+        start_collectd(collectd)
+        start_exporter(exporter)
+        start_pcp(pcp)
+        start_tavrel(tavrel, programs, seconds)
+        until("node_exporter does not answer", lambda: succeeds(
+            ["python3", "-c", f"import urllib.request as r; r.urlopen('http://{EXPORTER}/')"]))
+        began = time.monotonic()
+        for second in range(seconds):
+            time.sleep(max(0, began + second + 1 - time.monotonic()))
+            scrape(exporter)
+        for duty in duties:
+            duty.stop()
+        finish_tavrel(tavrel, programs)
+        count_collectd(collectd)
+        count_pcp(pcp)
+        count_tavrel(tavrel, programs)
+        print(f"{seconds} seconds, a reading a second, on {os.cpu_count()} CPUs")
+        print(f"{'':16}{'CPU':>9}{'memory':>12}{'written':>12}{'values':>10}{'values/CPU s':>15}")
+        for duty in duties:
+            written = (duty.disk.written() - duty.written) / 1e6
+            print(f"{duty.name:16}{duty.seconds:7.2f} s{duty.memory / 1024:8.1f} MiB"
+                  f"{written:9.2f} MB{duty.values:10}{duty.values / duty.seconds:15.0f}")
+
+
+if __name__ == "__main__":
+    main(pathlib.Path(sys.argv[1]).resolve(), pathlib.Path(sys.argv[2]), int(sys.argv[3]))
