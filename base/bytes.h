@@ -50,6 +50,15 @@ constexpr std::optional<Word> loadLittle(ByteSpan bytes, std::uint64_t offset) {
 }
 
 template <class Word>
+std::optional<Word> loadNative(ByteSpan bytes, std::uint64_t offset) {
+  const auto part = slice(bytes, offset, sizeof(Word));
+  if (!part) return std::nullopt;
+  Word word;
+  std::memcpy(&word, part->data(), sizeof word);
+  return word;
+}
+
+template <class Word>
 constexpr bool storeLittle(MutableByteSpan bytes, std::uint64_t offset, Word word) {
   if (!slice(bytes, offset, sizeof(Word))) return false;
   if (!std::is_constant_evaluated() && std::endian::native == std::endian::little) {
@@ -76,6 +85,14 @@ constexpr std::optional<std::uint32_t> loadLittle32(ByteSpan bytes, std::uint64_
 }
 constexpr std::optional<std::uint64_t> loadLittle64(ByteSpan bytes, std::uint64_t offset) {
   return bytes_detail::loadLittle<std::uint64_t>(bytes, offset);
+}
+
+/// In the order of this machine, for memory that programs on it share.
+inline std::optional<std::uint32_t> loadNative32(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadNative<std::uint32_t>(bytes, offset);
+}
+inline std::optional<std::uint64_t> loadNative64(ByteSpan bytes, std::uint64_t offset) {
+  return bytes_detail::loadNative<std::uint64_t>(bytes, offset);
 }
 
 /// The stores return false and write nothing when the word would not fit.

@@ -10,7 +10,6 @@
 #include "limits.h"
 #include "segment_format.h"
 
-_Static_assert(__BYTE_ORDER__ == __ORDER_LITTLE_ENDIAN__, "segments are little-endian");
 _Static_assert(ATOMIC_LLONG_LOCK_FREE == 2, "a shared mapping needs lock-free atomics");
 
 struct Cell {

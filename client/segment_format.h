@@ -1,8 +1,9 @@
 /* The layout of a segment: the file in which one process leaves what it recorded.
  *
  * A segment is a sparse file of kBHSegmentBytes in <root>/run/tavrel/stat/, a tmpfs, named
- * <anything>.segment. The process that records maps it; a reader uses pread. All numbers are
- * little-endian, every field is aligned to its size, and times are seconds unless stated.
+ * <anything>.segment. The process that records maps it; a reader uses pread. Numbers are in the
+ * machine's order of bytes, as a segment never leaves it; every field is aligned to its size, and
+ * times are seconds unless stated.
  *
  *   0            header
  *   kBHKeyTable  one 8-byte entry per key of the process

@@ -37,13 +37,13 @@ void SegmentFile::read(std::uint64_t offset, MutableByteSpan into) const {
 std::uint32_t SegmentFile::word32(std::uint64_t offset) const {
   std::array<std::byte, 4> bytes;
   read(offset, bytes);
-  return *loadLittle32(bytes, 0);
+  return *loadNative32(bytes, 0);
 }
 
 std::uint64_t SegmentFile::word64(std::uint64_t offset) const {
   std::array<std::byte, 8> bytes;
   read(offset, bytes);
-  return *loadLittle64(bytes, 0);
+  return *loadNative64(bytes, 0);
 }
 
 SegmentFacts SegmentFile::facts() const {
@@ -70,7 +70,7 @@ void SegmentFile::readKeys(std::uint32_t number) {
     Key& key = keys_[first + i + 1];
     if (key.isRead) continue;
     const std::uint64_t entry =
-        *loadLittle64(entries, std::size_t{i} * std::size_t{kBHKeyEntryBytes});
+        *loadNative64(entries, std::size_t{i} * std::size_t{kBHKeyEntryBytes});
     const std::uint64_t offset = entry & 0xffffffff;
     const std::size_t length = (entry >> 32) & 0xffff;
     if (length == 0 || length > kBHLongestName || offset > kBHNamesBytes ||

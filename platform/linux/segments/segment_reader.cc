@@ -107,19 +107,19 @@ struct CellLook {
 
 CellLook cellIn(ByteSpan bytes, std::uint64_t at) {
   CellLook look;
-  look.start = loadLittle64(bytes, at + kBHCellStart).value_or(0);
-  look.sets = loadLittle64(bytes, at + kBHCellSets).value_or(0);
+  look.start = loadNative64(bytes, at + kBHCellStart).value_or(0);
+  look.sets = loadNative64(bytes, at + kBHCellSets).value_or(0);
   const std::uint64_t slot = 8 * (look.sets % 2);
-  look.value = static_cast<std::int64_t>(loadLittle64(bytes, at + kBHCellSlots + slot).value_or(0));
-  look.setTime = loadLittle64(bytes, at + kBHCellTimes + slot).value_or(0);
-  look.key = loadLittle32(bytes, at + kBHCellKey).value_or(0);
-  look.closes = loadLittle32(bytes, at + kBHCellCloses).value_or(0);
-  look.acknowledged = loadLittle32(bytes, at + kBHCellAcknowledged).value_or(0);
+  look.value = static_cast<std::int64_t>(loadNative64(bytes, at + kBHCellSlots + slot).value_or(0));
+  look.setTime = loadNative64(bytes, at + kBHCellTimes + slot).value_or(0);
+  look.key = loadNative32(bytes, at + kBHCellKey).value_or(0);
+  look.closes = loadNative32(bytes, at + kBHCellCloses).value_or(0);
+  look.acknowledged = loadNative32(bytes, at + kBHCellAcknowledged).value_or(0);
   return look;
 }
 
 std::uint64_t markIn(ByteSpan chunk, std::uint32_t record) {
-  return *loadLittle64(chunk, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes + 8);
+  return *loadNative64(chunk, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes + 8);
 }
 
 bool awaitsAcknowledgement(const CellLook& look) {
@@ -163,10 +163,10 @@ SegmentReader::ChunkLook SegmentReader::chunkIn(ByteSpan bytes,
                                                 const SegmentPosition::Chunk& position,
                                                 bool writerIsGone) {
   ChunkLook look;
-  const std::uint32_t generation = *loadLittle32(bytes, kBHChunkGeneration);
+  const std::uint32_t generation = *loadNative32(bytes, kBHChunkGeneration);
   if (generation == 0 || generation % 2 != 0) return look;
   look.generation = generation;
-  look.acknowledged = *loadLittle32(bytes, kBHChunkAcknowledged);
+  look.acknowledged = *loadNative32(bytes, kBHChunkAcknowledged);
   if (position.generation == generation) {
     look.folded = std::min<std::uint32_t>(position.folded, kBHChunkRecords);
   }
@@ -331,7 +331,7 @@ void SegmentReader::takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t in
       continue;
     }
     const std::uint64_t bits =
-        *loadLittle64(bytes, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes);
+        *loadNative64(bytes, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes);
     reading.sink.takeRecord(
         {*key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
   }
