@@ -1,5 +1,6 @@
 #include <csignal>
 #include <cstddef>
+#include <cstdio>
 #include <exception>
 #include <fcntl.h>
 #include <span>
@@ -23,6 +24,15 @@ void secureStandardStreams() {
   while (descriptor >= 0 && descriptor <= STDERR_FILENO)
     descriptor = open("/dev/null", O_RDWR);
   if (descriptor >= 0) close(descriptor);
+}
+
+// A line takes memory, of which there may be none left.
+void tellEnd(const std::exception& error) {
+  try {
+    tavrel::LinuxSystemLog().log(tavrel::LogLevel::Error, "run ended early: %s", error.what());
+  } catch (const std::exception&) {
+    std::fputs("tavrel: run ended early: out of memory\n", stderr);
+  }
 }
 
 std::string_view taskOf(int argc, char** argv) {
@@ -58,7 +68,7 @@ int main(int argc, char** argv) {
     }
     memory.finish();
   } catch (const std::exception& error) {
-    LinuxSystemLog().log(LogLevel::Error, "run ended early: %s", error.what());
+    tellEnd(error);
   }
   return 0;
 }

@@ -1,4 +1,5 @@
 // tavrel-health: reads the health of all drives once, with the rights that only this takes.
+#include <cstdio>
 #include <exception>
 
 #include "base/arithmetic.h"
@@ -8,7 +9,7 @@
 
 // Exit status 1 when a reading or the memory could not be written. A drive that cannot be read has
 // a reading that says so.
-int main() {
+int main() try {
   using namespace tavrel;
   LinuxSystemLog log;
   try {
@@ -25,5 +26,9 @@ int main() {
   } catch (const std::exception& error) {
     log.log(LogLevel::Error, "reading of drives ended early: %s", error.what());
   }
+  return 1;
+} catch (const std::exception&) {
+  // A message takes memory, of which there is none left.
+  std::fputs("tavrel-health: out of memory\n", stderr);
   return 1;
 }

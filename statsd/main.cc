@@ -1,6 +1,7 @@
 // tavrel-statsd: records what programs send as StatsD datagrams.
 #include <charconv>
 #include <cstdio>
+#include <exception>
 #include <getopt.h>
 #include <string>
 #include <string_view>
@@ -143,6 +144,10 @@ int run(int argc, char** argv) {
 }  // namespace
 }  // namespace tavrel
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
   return tavrel::run(argc, argv);
+} catch (const std::exception&) {
+  // What goes wrong is returned, except that memory runs out.
+  std::fputs("tavrel-statsd: out of memory\n", stderr);
+  return 1;
 }

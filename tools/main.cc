@@ -1,4 +1,6 @@
+#include <cstdio>
 #include <cstdlib>
+#include <exception>
 #include <iostream>
 #include <optional>
 #include <string>
@@ -30,7 +32,7 @@ bool isColoured() {
 
 }  // namespace
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
   std::ios::sync_with_stdio(false);
   return tavrel::runTavrelctl(std::vector<std::string>(argv + 1, argv + argc),
                               {.in = std::cin,
@@ -40,4 +42,8 @@ int main(int argc, char** argv) {
                                .errorIsTerminal = isatty(STDERR_FILENO) == 1,
                                .inIsTerminal = isatty(STDIN_FILENO) == 1,
                                .outIsColoured = isColoured()});
+} catch (const std::exception&) {
+  // What else goes wrong has been said; a message takes memory, of which there is none left.
+  std::fputs("tavrelctl: out of memory\n", stderr);
+  return 1;
 }

@@ -97,6 +97,10 @@ int run(int argc, char** argv) {
 }  // namespace
 }  // namespace tavrel::upload
 
-int main(int argc, char** argv) {
+int main(int argc, char** argv) try {
   return tavrel::upload::run(argc, argv);
+} catch (const std::exception&) {
+  // A message takes memory, of which there is none left.
+  std::fputs("tavrel-upload: out of memory\n", stderr);
+  return 1;
 }

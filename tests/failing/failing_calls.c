@@ -1,0 +1,176 @@
+/* Preloaded into a program by script/failing-calls: lets one call of a kind fail, or all from it on.
+ *
+ *   FAILING_KIND    allocation, open, read, write, flush, rename, map or truncate
+ *   FAILING_AT      which call of that kind, from 1; "12+" is the twelfth and all later ones
+ *   FAILING_MARK    a file that is made once a call has failed
+ */
+#define _GNU_SOURCE
+#include <dlfcn.h>
+#include <errno.h>
+#include <fcntl.h>
+#include <stdarg.h>
+#include <stdatomic.h>
+#include <stdbool.h>
+#include <stdlib.h>
+#include <string.h>
+#include <sys/mman.h>
+#include <sys/syscall.h>
+#include <sys/uio.h>
+#include <unistd.h>
+
+enum Kind { kNone, kAllocation, kOpen, kRead, kWrite, kFlush, kRename, kMap, kTruncate };
+
+static const char* const kNames[] = {"none",  "allocation", "open", "read",    "write",
+                                     "flush", "rename",     "map",  "truncate"};
+
+static enum Kind kind;
+static long at;
+static bool andLater;
+static const char* mark;
+static atomic_long calls;
+
+__attribute__((constructor)) static void readSettings(void) {
+  const char* const name = getenv("FAILING_KIND");
+  const char* const number = getenv("FAILING_AT");
+  mark = getenv("FAILING_MARK");
+  if (name == NULL || number == NULL || mark == NULL) return;
+  char* end = NULL;
+  at = strtol(number, &end, 10);
+  andLater = *end == '+';
+  for (enum Kind each = kAllocation; each <= kTruncate; ++each) {
+    if (strcmp(name, kNames[each]) == 0) kind = each;
+  }
+}
+
+static bool fails(enum Kind called, int error) {
+  if (called != kind) return false;
+  const long number = atomic_fetch_add(&calls, 1) + 1;
+  if (number != at && !(andLater && number > at)) return false;
+  if (number == at) {
+    const long file = syscall(SYS_openat, AT_FDCWD, mark, O_CREAT | O_WRONLY, 0600);
+    if (file >= 0) syscall(SYS_close, file);
+  }
+  errno = error;
+  return true;
+}
+
+/* The function of the C library. Found while it is called, as dlsym itself may allocate. */
+#define REAL(name)                                 \
+  static __typeof__(&name) real = NULL;            \
+  if (real == NULL) {                              \
+    void* const found = dlsym(RTLD_NEXT, #name);   \
+    memcpy(&real, &found, sizeof real);            \
+  }
+
+extern void* __libc_malloc(size_t size);
+extern void* __libc_calloc(size_t count, size_t size);
+extern void* __libc_realloc(void* block, size_t size);
+
+void* malloc(size_t size) {
+  return fails(kAllocation, ENOMEM) ? NULL : __libc_malloc(size);
+}
+void* calloc(size_t count, size_t size) {
+  return fails(kAllocation, ENOMEM) ? NULL : __libc_calloc(count, size);
+}
+void* realloc(void* block, size_t size) {
+  return fails(kAllocation, ENOMEM) ? NULL : __libc_realloc(block, size);
+}
+
+static mode_t modeOf(int flags, va_list arguments) {
+  return (flags & (O_CREAT | O_TMPFILE)) != 0 ? va_arg(arguments, mode_t) : 0;
+}
+
+int open(const char* path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = modeOf(flags, arguments);
+  va_end(arguments);
+  REAL(open)
+  return fails(kOpen, EMFILE) ? -1 : real(path, flags, mode);
+}
+int open64(const char* path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = modeOf(flags, arguments);
+  va_end(arguments);
+  REAL(open64)
+  return fails(kOpen, EMFILE) ? -1 : real(path, flags, mode);
+}
+int openat(int folder, const char* path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = modeOf(flags, arguments);
+  va_end(arguments);
+  REAL(openat)
+  return fails(kOpen, EMFILE) ? -1 : real(folder, path, flags, mode);
+}
+
+ssize_t read(int file, void* bytes, size_t length) {
+  REAL(read)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length);
+}
+ssize_t pread(int file, void* bytes, size_t length, off_t offset) {
+  REAL(pread)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length, offset);
+}
+ssize_t pread64(int file, void* bytes, size_t length, off64_t offset) {
+  REAL(pread64)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length, offset);
+}
+
+ssize_t write(int file, const void* bytes, size_t length) {
+  REAL(write)
+  return fails(kWrite, ENOSPC) ? -1 : real(file, bytes, length);
+}
+ssize_t writev(int file, const struct iovec* pieces, int count) {
+  REAL(writev)
+  return fails(kWrite, ENOSPC) ? -1 : real(file, pieces, count);
+}
+ssize_t pwrite(int file, const void* bytes, size_t length, off_t offset) {
+  REAL(pwrite)
+  return fails(kWrite, ENOSPC) ? -1 : real(file, bytes, length, offset);
+}
+ssize_t pwrite64(int file, const void* bytes, size_t length, off64_t offset) {
+  REAL(pwrite64)
+  return fails(kWrite, ENOSPC) ? -1 : real(file, bytes, length, offset);
+}
+
+int fsync(int file) {
+  REAL(fsync)
+  return fails(kFlush, EIO) ? -1 : real(file);
+}
+int fdatasync(int file) {
+  REAL(fdatasync)
+  return fails(kFlush, EIO) ? -1 : real(file);
+}
+
+int rename(const char* from, const char* to) {
+  REAL(rename)
+  return fails(kRename, EIO) ? -1 : real(from, to);
+}
+int renameat(int fromFolder, const char* from, int toFolder, const char* to) {
+  REAL(renameat)
+  return fails(kRename, EIO) ? -1 : real(fromFolder, from, toFolder, to);
+}
+int renameat2(int fromFolder, const char* from, int toFolder, const char* to, unsigned flags) {
+  REAL(renameat2)
+  return fails(kRename, EIO) ? -1 : real(fromFolder, from, toFolder, to, flags);
+}
+
+void* mmap(void* address, size_t length, int protection, int flags, int file, off_t offset) {
+  REAL(mmap)
+  return fails(kMap, ENOMEM) ? MAP_FAILED : real(address, length, protection, flags, file, offset);
+}
+void* mmap64(void* address, size_t length, int protection, int flags, int file, off64_t offset) {
+  REAL(mmap64)
+  return fails(kMap, ENOMEM) ? MAP_FAILED : real(address, length, protection, flags, file, offset);
+}
+
+int ftruncate(int file, off_t length) {
+  REAL(ftruncate)
+  return fails(kTruncate, ENOSPC) ? -1 : real(file, length);
+}
+int ftruncate64(int file, off64_t length) {
+  REAL(ftruncate64)
+  return fails(kTruncate, ENOSPC) ? -1 : real(file, length);
+}
