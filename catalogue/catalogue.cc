@@ -1,0 +1,115 @@
+#include "catalogue/catalogue.h"
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <iterator>
+#include <tuple>
+
+namespace tavrel::catalogue {
+namespace {
+
+#include "catalogue_rows.inc"
+
+constexpr std::string_view prefixOf(const Entry& entry) {
+  return entry.key.substr(0, entry.key.find_first_of("<*"));
+}
+
+constexpr bool isSorted(std::span<const Entry> rows) {
+  return std::ranges::is_sorted(rows, {}, [](const Entry& row) {
+    return std::tuple(row.driver, row.group, prefixOf(row), row.key);
+  });
+}
+static_assert(isSorted(kStatistics) && isSorted(kChannels) && isSorted(kControllers));
+
+constexpr bool isDigit(char c) {
+  return c >= '0' && c <= '9';
+}
+
+bool fits(std::string_view text, std::string_view pattern) {
+  const std::size_t literal = std::min(pattern.find_first_of("<*"), pattern.size());
+  if (!text.starts_with(pattern.substr(0, literal))) return false;
+  text.remove_prefix(literal);
+  pattern.remove_prefix(literal);
+  if (pattern.empty()) return text.empty();
+  if (pattern == "*") return true;
+  const std::string_view rest = pattern.substr(pattern.find('>') + 1);
+  const bool isNumber = pattern.starts_with("<n>");
+  for (std::size_t taken = isNumber ? 0 : 1; taken <= text.size(); ++taken) {
+    if (isNumber && taken > 0 && !isDigit(text[taken - 1])) return false;
+    if (fits(text.substr(taken), rest)) return true;
+  }
+  return false;
+}
+
+std::size_t literalLength(std::string_view pattern) {
+  std::size_t length = 0;
+  bool isInside = false;
+  for (const char c : pattern) {
+    isInside = (isInside || c == '<') && c != '>';
+    length += !isInside && c != '>' && c != '*';
+  }
+  return length;
+}
+
+// `rows` are sorted by their prefixes.
+const Entry* find(std::span<const Entry> rows, std::string_view name) {
+  // Prefixes that begin `probe` come before all that are greater than it, so the last one that is
+  // not greater either begins it or shares with it what a shorter one could be.
+  std::string_view probe = name;
+  while (true) {
+    const auto end = std::ranges::upper_bound(rows, probe, {}, prefixOf);
+    if (end == rows.begin()) return nullptr;
+    const std::string_view prefix = prefixOf(end[-1]);
+    if (!name.starts_with(prefix)) {
+      const auto differs = std::ranges::mismatch(probe, prefix).in1;
+      probe = probe.substr(0, static_cast<std::size_t>(differs - probe.begin()));
+      continue;
+    }
+    const Entry* best = nullptr;
+    for (auto row = end; row != rows.begin() && prefixOf(row[-1]) == prefix; --row) {
+      const Entry& entry = row[-1];
+      if (best && literalLength(best->key) >= literalLength(entry.key)) continue;
+      if (fits(name, entry.key)) best = &entry;
+    }
+    if (best || prefix.empty()) return best;
+    probe = prefix.substr(0, prefix.size() - 1);
+  }
+}
+
+}  // namespace
+
+const Entry* findStatistic(std::string_view key) {
+  return find(kStatistics, key);
+}
+
+const Entry* findChannel(std::string_view driver, std::string_view group,
+                         std::string_view channel) {
+  driver = driver.substr(0, driver.find(" <id "));
+  const auto place = [](const Entry& row) { return std::pair(row.driver, row.group); };
+  const auto rows = std::ranges::equal_range(kChannels, std::pair(driver, group), {}, place);
+  return find({rows.begin(), rows.end()}, channel);
+}
+
+const Entry* findController(std::string_view name) {
+  return find(kControllers, name);
+}
+
+std::span<const Entry> entries(Kind kind) {
+  switch (kind) {
+    case Kind::Channel:
+      return kChannels;
+    case Kind::Controller:
+      return kControllers;
+    default:
+      return kStatistics;
+  }
+}
+
+std::string_view nameOf(Since since) {
+  constexpr std::array<std::string_view, 8> kNames = {"",     "now",    "day",   "run",
+                                                      "boot", "attach", "reset", "life"};
+  return kNames[static_cast<std::size_t>(since)];
+}
+
+}  // namespace tavrel::catalogue
