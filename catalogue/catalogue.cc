@@ -53,7 +53,7 @@ std::size_t literalLength(std::string_view pattern) {
 }
 
 // `rows` are sorted by their prefixes.
-const Entry* find(std::span<const Entry> rows, std::string_view name) {
+const Entry* findRow(std::span<const Entry> rows, std::string_view name) {
   // Prefixes that begin `probe` come before all that are greater than it, so the last one that is
   // not greater either begins it or shares with it what a shorter one could be.
   std::string_view probe = name;
@@ -75,6 +75,13 @@ const Entry* find(std::span<const Entry> rows, std::string_view name) {
     if (best || prefix.empty()) return best;
     probe = prefix.substr(0, prefix.size() - 1);
   }
+}
+
+// The second channel of a name ends in "#2".
+const Entry* find(std::span<const Entry> rows, std::string_view name) {
+  const std::size_t mark = name.find_last_not_of("0123456789");
+  const bool isNumbered = mark < name.size() - 1 && name[mark] == '#';
+  return findRow(rows, isNumbered ? name.substr(0, mark) : name);
 }
 
 }  // namespace

@@ -8,6 +8,7 @@
 
 #include "base/format.h"
 #include "base/version.h"
+#include "tools/catalogue/catalogue_command.h"
 #include "tools/completion/completion_command.h"
 #include "tools/consent/erase_command.h"
 #include "tools/consent/permission_commands.h"
@@ -81,6 +82,7 @@ constexpr Subcommand kSubcommands[] = {
     {"log", addLogCommands},
     {"whitelist", addWhitelistCommands},
     {"stat", addStatCommands},
+    {"catalogue", addCatalogueCommand},
     {"send", addSendCommands},
     {"notify", addNotifyCommands},
     {"tasking", addTaskingCommands},

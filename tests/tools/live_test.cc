@@ -4,6 +4,7 @@
 #include <ctime>
 #include <sys/stat.h>
 
+#include "catalogue/catalogue.h"
 #include "tests/tools/device.h"
 
 namespace tavrel {
@@ -16,6 +17,31 @@ struct File {
 const std::string kCpu = "/sys/devices/system/cpu/";
 const std::string kZone = "/sys/class/thermal/";
 const std::string kHwmon = "/sys/class/hwmon/";
+
+// The catalogue has the channel, in its unit, and also as a statistic if the daily run stores it.
+void expectInCatalogue(const nlohmann::json& channel) {
+  static const std::map<std::string, std::string_view> units = {
+      {"s", "seconds"},        {"ms", "milliseconds"},
+      {"us", "microseconds"},  {"ns", "nanoseconds"},
+      {"B", "bytes"},          {"KiB", "KiB"},
+      {"4KiB", "4-KiB pages"}, {"events", "count"},
+      {"packets", "packets"},  {"mC", "thousandths of a degree Celsius"},
+      {"mV", "millivolts"},    {"uV", "microvolts"},
+      {"mA", "milliamperes"},  {"uA", "microamperes"},
+      {"uW", "microwatts"},    {"uJ", "microjoules"}};
+  const auto name = channel["name"].get<std::string>();
+  const auto* const entry = catalogue::findChannel(channel["driver"].get<std::string>(),
+                                                   channel["group"].get<std::string>(), name);
+  ASSERT_TRUE(entry) << channel;
+  if (channel["unit_label"].is_string()) {
+    EXPECT_EQ(entry->unit, units.at(channel["unit_label"].get<std::string>())) << channel;
+  }
+  const std::string prefix = "com.norvane.ioreport.";
+  const auto* const statistic = catalogue::findStatistic(prefix + name);
+  ASSERT_TRUE(statistic) << channel;
+  EXPECT_EQ(statistic->key == prefix + std::string(entry->key), channel["categories"] == 0x100)
+      << channel;
+}
 
 struct LiveDevice : TemporaryDevice {
   LiveDevice(const std::vector<File>& files) {
@@ -31,6 +57,7 @@ struct LiveDevice : TemporaryDevice {
     const auto json = nlohmann::json::parse(outcome.out, nullptr, false);
     if (json.is_discarded()) return outcome.error;
     for (const auto& channel : json["channels"]) {
+      expectInCatalogue(channel);
       text += channel["name"].get<std::string>() + '=';
       if (channel.contains("value")) text += channel["value"].dump();
       for (const auto& value : channel.value("values", nlohmann::json::array()))
@@ -307,6 +334,14 @@ TEST(LiveTest, TheDailyRunStoresTheHealthOfDrives) {
       "com.norvane.ioreport.nvme0.critical_warning --value 2048000");
   EXPECT_EQ(rules["keys"][0]["scalar"]["reported_value"], 2'000'000);
   EXPECT_EQ(rules["keys"][1]["scalar"]["reported_value"], 2'048'000);
+}
+
+TEST(LiveTest, TheCatalogueHasTheChannelsOfThisMachine) {
+  const Outcome list = TemporaryDevice::runAt("/", "report list --live --json");
+  const auto json = nlohmann::json::parse(list.out);
+  EXPECT_GE(json["channels"].size(), 100U);
+  for (const auto& channel : json["channels"])
+    expectInCatalogue(channel);
 }
 
 // Every daily figure of this machine is in the example, which has nothing to complain about.

@@ -8,6 +8,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "catalogue/catalogue.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
@@ -84,6 +85,18 @@ Expected<Statistic> readStatistic(RecordedHistory& history, const std::string& k
   return statistic;
 }
 
+// "Scalar com.norvane.usage.swap.used_mib, 2 days", and what it means where the catalogue says so.
+void printTitle(ToolContext& context, const char* kind, const std::string& key, std::size_t days) {
+  context.out() << kind << ' ' << printable(key) << ", " << counted(days, "day") << '\n';
+  const catalogue::Entry* const entry = catalogue::findStatistic(key);
+  if (entry && !entry->meaning.empty()) {
+    context.out() << entry->meaning;
+    if (!entry->unit.empty()) context.out() << " (" << entry->unit << ')';
+    context.out() << '\n';
+  }
+  context.out() << '\n';
+}
+
 // -- JSON ----------------------------------------------------------------------------------------
 
 Json jsonOfDay(std::int32_t day) {
@@ -138,8 +151,7 @@ Json jsonOfDistribution(const Statistic& statistic) {
 constexpr auto kRight = Table::Align::Right;
 
 void printScalar(ToolContext& context, const Statistic& statistic) {
-  const auto count = statistic.scalarDays.size();
-  context.out() << "Scalar " << printable(statistic.key) << ", " << counted(count, "day") << "\n\n";
+  printTitle(context, "Scalar", statistic.key, statistic.scalarDays.size());
   Table table({{"DAY"}, {"VALUE", kRight}}, 2);
   for (const ScalarDay& day : statistic.scalarDays)
     table.add({dayText(day.day), std::to_string(day.value)});
@@ -157,8 +169,7 @@ void printDistribution(ToolContext& context, const Statistic& statistic) {
   std::ostream& out = context.out();
   const Page page = context.page();
   const Summary& summary = statistic.summary;
-  out << "Distribution " << printable(statistic.key) << ", "
-      << counted(statistic.distributionDays.size(), "day") << "\n\n";
+  printTitle(context, "Distribution", statistic.key, statistic.distributionDays.size());
   const std::vector<std::string> cells = cellsOf(summary);
   Table facts({{""}, {"", kRight}}, 2);
   facts.add({"Count", cells[0]});
