@@ -27,6 +27,8 @@ constexpr bool isDigit(char c) {
 }
 
 bool fits(std::string_view text, std::string_view pattern) {
+  const std::string_view tail = pattern.substr(pattern.rfind('>') + 1);
+  if (!tail.ends_with('*') && !text.ends_with(tail)) return false;
   const std::size_t literal = std::min(pattern.find_first_of("<*"), pattern.size());
   if (!text.starts_with(pattern.substr(0, literal))) return false;
   text.remove_prefix(literal);

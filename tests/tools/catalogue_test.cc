@@ -227,6 +227,9 @@ TEST(CatalogueTest, TheToolShowsEntries) {
   device.check("stat show com.norvane.usage.swap.used_mib",
                prints("Scalar com.norvane.usage.swap.used_mib, 1 day\nSwap space in use (MiB)\n\n"
                       "  DAY                 VALUE\n  20700 (2026-09-04)      7\n"));
+  const auto json = device.json("stat show com.norvane.usage.swap.used_mib");
+  EXPECT_EQ(json["meaning"], "Swap space in use");
+  EXPECT_EQ(json["unit"], "MiB");
 }
 
 }  // namespace

@@ -167,7 +167,7 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       "prefs list com.example.a|prefs get com.example.a n|plist show " +
       device.path("/var/mobile/Library/Preferences/com.example.a.plist") +
       "|registry list|registry show 4294967809|report list|report list --flat|report sample|"
-      "report sample --delta --interval 0|disks|disks --all");
+      "report sample --delta --interval 0|disks|disks --all|catalogue");
   // Commands whose two outputs cannot be compared: each run differs (disk space, identifiers), a
   // run changes what the next one prints, or the text is a document of its own.
   std::set<std::string> covered{"allow",       "deny",        "erase",    "log preview",

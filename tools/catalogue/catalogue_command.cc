@@ -106,13 +106,12 @@ void show(ToolContext& context, const std::vector<std::string>& keys) {
 }
 
 void printAll(ToolContext& context, const KindText& kind) {
-  const auto rows = catalogue::entries(kind.kind);
   const bool isChannel = kind.kind == Kind::Channel;
   std::vector<Table::Column> columns = {
       {"KEY", Table::Align::Whole}, {"UNIT"}, {"SINCE"}, {"MEANING"}};
   if (isChannel) columns.insert(columns.begin(), {{"DRIVER"}, {"GROUP"}});
   Table table(std::move(columns), 2);
-  for (const Entry& row : rows) {
+  for (const Entry& row : catalogue::entries(kind.kind)) {
     std::vector<Table::Cell> cells;
     if (isChannel) cells = {std::string(row.driver), std::string(row.group)};
     cells.emplace_back(std::string(row.key));
@@ -121,8 +120,7 @@ void printAll(ToolContext& context, const KindText& kind) {
     cells.emplace_back(textOf(row.meaning));
     table.add(std::move(cells));
   }
-  const std::string title = format("%s (%zu)", kind.title, rows.size());
-  context.out() << context.page().styled(title, Emphasis::Strong) << '\n';
+  context.out() << context.page().styled(kind.title, Emphasis::Strong) << '\n';
   table.print(context.page());
 }
 

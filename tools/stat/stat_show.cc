@@ -221,7 +221,13 @@ void showStatistic(ToolContext& context, const std::string& key,
     return context.fail(format("no statistic %s%s: see 'tavrelctl stat list'", key, when));
   }
   if (context.json()) {
+    const catalogue::Entry* const entry = catalogue::findStatistic(key);
+    const auto known = [&](std::string_view catalogue::Entry::*text) {
+      return entry && !(entry->*text).empty() ? Json(entry->*text) : Json(nullptr);
+    };
     return context.printJson({{"key", key},
+                              {"meaning", known(&catalogue::Entry::meaning)},
+                              {"unit", known(&catalogue::Entry::unit)},
                               {"scalar", jsonOfScalar(*statistic)},
                               {"distribution", jsonOfDistribution(*statistic)}});
   }
