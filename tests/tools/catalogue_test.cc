@@ -52,6 +52,7 @@ TEST(CatalogueTest, FindsRows) {
       {"com.norvane.ioreport.fs.errorsX", "com.norvane.ioreport.*"},
       {"com.norvane.ioreport.", "com.norvane.ioreport.*"},
       {"com.norvane.ioreport", "none"},
+      {"statsd.tavrel-statsd.too_long", "statsd.tavrel-statsd.too_long"},
       {"com.norvane.NANDInfo.PadSize4", "com.norvane.NANDInfo.PadSize<n>"},
       {"com.norvane.NANDInfo.PadSize4x", "none"},
   };
