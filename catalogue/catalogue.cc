@@ -3,26 +3,18 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
-#include <iterator>
-#include <tuple>
+#include <utility>
 
 namespace tavrel::catalogue {
 namespace {
 
 #include "catalogue_rows.inc"
 
-constexpr std::string_view prefixOf(const Entry& entry) {
+std::string_view prefixOf(const Entry& entry) {
   return entry.key.substr(0, entry.key.find_first_of("<*"));
 }
 
-constexpr bool isSorted(std::span<const Entry> rows) {
-  return std::ranges::is_sorted(rows, {}, [](const Entry& row) {
-    return std::tuple(row.driver, row.group, prefixOf(row), row.key);
-  });
-}
-static_assert(isSorted(kStatistics) && isSorted(kChannels) && isSorted(kControllers));
-
-constexpr bool isDigit(char c) {
+bool isDigit(char c) {
   return c >= '0' && c <= '9';
 }
 
@@ -96,8 +88,10 @@ const Entry* findChannel(std::string_view driver, std::string_view group,
                          std::string_view channel) {
   driver = driver.substr(0, driver.find(" <id "));
   const auto place = [](const Entry& row) { return std::pair(row.driver, row.group); };
-  const auto rows = std::ranges::equal_range(kChannels, std::pair(driver, group), {}, place);
-  return find({rows.begin(), rows.end()}, channel);
+  const std::pair wanted(driver, group);
+  const auto first = std::ranges::lower_bound(kChannels, wanted, {}, place);
+  const auto last = std::ranges::upper_bound(kChannels, wanted, {}, place);
+  return find({first, last}, channel);
 }
 
 const Entry* findController(std::string_view name) {
