@@ -2,9 +2,9 @@
 #include <cmath>
 #include <limits>
 
+#include "base/quantity_text.h"
 #include "device.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 

@@ -1,8 +1,8 @@
 // The health of the drives, as it was last read.
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "tools/check/checks.h"
 #include "tools/disks/disk_list.h"
-#include "tools/shared/quantity_text.h"
 
 namespace tavrel {
 namespace {

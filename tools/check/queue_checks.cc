@@ -1,12 +1,12 @@
 // Logs that wait, and what the uploader could not do.
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/plist/coding.h"
 #include "tools/check/checks.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

@@ -5,11 +5,11 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/folding/fold_notes.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/check/checks.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/stat/recorded.h"
 

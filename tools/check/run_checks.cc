@@ -2,6 +2,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/runs/last_run.h"
@@ -9,7 +10,6 @@
 #include "tools/check/checks.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 

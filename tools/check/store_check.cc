@@ -6,12 +6,12 @@
 #include <unistd.h>
 
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/limits/device_limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "tools/check/checks.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

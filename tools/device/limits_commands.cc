@@ -5,11 +5,11 @@
 #include <ostream>
 
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

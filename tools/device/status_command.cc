@@ -5,6 +5,7 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
@@ -14,7 +15,6 @@
 #include "tools/check/check.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

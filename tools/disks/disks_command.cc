@@ -6,9 +6,9 @@
 #include <ostream>
 
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "base/text.h"
 #include "tools/disks/disk_list.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

@@ -9,13 +9,13 @@
 #include "base/format.h"
 #include "base/iso_date.h"
 #include "base/limits.h"
+#include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
 #include "report/bh_report.h"
 #include "tools/log/filed_logs.h"
 #include "tools/shared/day_argument.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

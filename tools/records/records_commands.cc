@@ -12,6 +12,7 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "base/text.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
@@ -21,7 +22,6 @@
 #include "tools/records/record_reader.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_list.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

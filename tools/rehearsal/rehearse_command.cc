@@ -8,11 +8,11 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/rehearsal/rehearsal.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/json_value.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 

@@ -2,8 +2,8 @@
 
 #include <cmath>
 
+#include "base/quantity_text.h"
 #include "ioreport/ioreport.h"
-#include "tools/shared/quantity_text.h"
 
 namespace tavrel {
 namespace {

@@ -8,11 +8,11 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/quantity_text.h"
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
 #include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
-#include "tools/shared/quantity_text.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {

@@ -1,4 +1,4 @@
-#include "tools/shared/quantity_text.h"
+#include "base/quantity_text.h"
 
 #include <algorithm>
 #include <cmath>
