@@ -1,0 +1,131 @@
+#include <algorithm>
+#include <cmath>
+#include <utility>
+
+#include "base/format.h"
+#include "page/charts.h"
+
+namespace tavrel::page {
+namespace {
+
+using Values = std::vector<std::optional<double>>;
+
+constexpr int kHeight = 100;  // of the drawing; a day is one unit wide
+
+struct Range {
+  double low = 0, high = 0;
+  std::size_t told = 0;
+
+  void take(const Values& values) {
+    for (const auto& value : values) {
+      if (!value || !std::isfinite(*value)) continue;
+      low = told == 0 ? *value : std::min(low, *value);
+      high = told == 0 ? *value : std::max(high, *value);
+      ++told;
+    }
+  }
+};
+
+// From top to bottom.
+int heightOf(double value, const Range& range) {
+  if (range.low == range.high) return kHeight / 2;
+  // Halves keep the difference of large values finite.
+  const double share = (value / 2 - range.low / 2) / (range.high / 2 - range.low / 2);
+  return static_cast<int>(std::lround((1 - share) * kHeight));
+}
+
+bool isTold(const Values& values, std::size_t day) {
+  return day < values.size() && values[day] && std::isfinite(*values[day]);
+}
+
+// Where the days from `day` on end whose values are told without a gap.
+std::size_t endOfRun(const Values& values, std::size_t day) {
+  while (isTold(values, day))
+    ++day;
+  return day;
+}
+
+// The points of a run in relative steps, from its second one.
+void appendSteps(std::string& path, const Values& values, std::size_t begin, std::size_t end,
+                 const Range& range) {
+  int before = heightOf(*values[begin], range);
+  for (std::size_t day = begin + 1; day < end; ++day) {
+    const int height = heightOf(*values[day], range);
+    appendFormat(path, "%s1 %d", day == begin + 1 ? "l" : " ", height - before);
+    before = height;
+  }
+}
+
+std::string linePath(const Values& values, const Range& range) {
+  std::string path;
+  for (std::size_t day = 0; day < values.size(); ++day) {
+    const std::size_t end = endOfRun(values, day);
+    if (end == day) continue;
+    appendFormat(path, "M%zu %d", day, heightOf(*values[day], range));
+    // A line of no length is a dot.
+    if (end == day + 1) path += "h0";
+    appendSteps(path, values, day, end, range);
+    day = end;
+  }
+  return path;
+}
+
+// Areas along the lows and back along the highs.
+std::string bandPath(const LineChart& chart, const Range& range) {
+  std::string path;
+  for (std::size_t day = 0; day < chart.lows.size(); ++day) {
+    const std::size_t end = std::min(endOfRun(chart.lows, day), endOfRun(chart.highs, day));
+    if (end <= day + 1) continue;
+    appendFormat(path, "M%zu %d", day, heightOf(*chart.lows[day], range));
+    appendSteps(path, chart.lows, day, end, range);
+    int before = heightOf(*chart.highs[end - 1], range);
+    appendFormat(path, "V%d", before);
+    for (std::size_t back = end - 1; back-- > day;) {
+      const int height = heightOf(*chart.highs[back], range);
+      appendFormat(path, "%s-1 %d", back + 2 == end ? "l" : " ", height - before);
+      before = height;
+    }
+    path += 'Z';
+    day = end;
+  }
+  return path;
+}
+
+std::string nameOf(const LineChart& chart, const Range& line) {
+  if (line.told == 0) return chart.name + ": nothing told";
+  std::string name = format("%s: %s to %s, %zu of %zu days told, lowest %s, highest %s", chart.name,
+                            chart.first, chart.last, line.told, chart.values.size(),
+                            chart.text(line.low), chart.text(line.high));
+  for (auto value = chart.values.rbegin(); value != chart.values.rend(); ++value) {
+    if (!*value || !std::isfinite(**value)) continue;
+    return name + ", last " + chart.text(**value);
+  }
+  return name;
+}
+
+}  // namespace
+
+void writeLineChart(HtmlWriter& html, const LineChart& chart) {
+  Range line;
+  line.take(chart.values);
+  Range range = line;
+  range.take(chart.lows);
+  range.take(chart.highs);
+  const std::size_t width = std::max<std::size_t>(chart.values.size(), 2) - 1;
+  html.begin("div", {{"class", "line"}});
+  html.element("span", range.told == 0 ? "" : chart.text(range.high), {{"class", "top"}});
+  if (range.low != range.high) html.element("span", chart.text(range.low), {{"class", "bottom"}});
+  html.begin("svg", {{"role", "img"},
+                     {"aria-label", nameOf(chart, line)},
+                     {"viewBox", format("0 0 %zu %d", width, kHeight)},
+                     {"preserveAspectRatio", "none"}});
+  if (const std::string band = bandPath(chart, range); !band.empty())
+    html.empty("path", {{"class", "band"}, {"d", band}});
+  html.empty("path", {{"d", linePath(chart.values, range)}});
+  html.end();
+  html.element("span", chart.first, {{"class", "first"}});
+  html.element("span", chart.last, {{"class", "last"}});
+  html.end();
+}
+
+}  // namespace tavrel::page
