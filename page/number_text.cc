@@ -1,6 +1,8 @@
 #include "page/number_text.h"
 
+#include <algorithm>
 #include <cmath>
+#include <iterator>
 
 #include "base/format.h"
 #include "base/quantity_text.h"
@@ -9,7 +11,9 @@
 namespace tavrel::page {
 namespace {
 
-constexpr std::string_view kNarrowBlank = "\u202F";
+// They do not break.
+constexpr char kNarrowBlank[] = "\u202F";
+constexpr char kBlank[] = "\u00A0";
 
 // Groups the digits before the point; a number with an exponent stays as it is.
 std::string grouped(std::string_view digits) {
@@ -27,21 +31,35 @@ std::string grouped(std::string_view digits) {
   return text.append(digits.substr(whole));
 }
 
-// How a unit is written in data, what one of it is in a unit that takes prefixes, and that unit.
+// A unit as catalogue/ names it, and its size in one that takes prefixes.
 struct ScaledUnit {
   std::string_view name;
   double factor;
-  std::string_view base;  // "B": of sizes
+  std::string_view base;
 };
 
-constexpr ScaledUnit kScaledUnits[] = {
-    {"B", 1, "B"},        {"bytes", 1, "B"}, {"KiB", 0x1p10, "B"}, {"MiB", 0x1p20, "B"},
-    {"GiB", 0x1p30, "B"}, {"ns", 1e-9, "s"}, {"µs", 1e-6, "s"},    {"us", 1e-6, "s"},
-    {"ms", 1e-3, "s"},    {"s", 1, "s"},     {"W", 1, "W"},        {"mW", 1e-3, "W"},
-    {"µW", 1e-6, "W"},    {"J", 1, "J"},     {"mJ", 1e-3, "J"},    {"µJ", 1e-6, "J"},
-    {"A", 1, "A"},        {"mA", 1e-3, "A"}, {"µA", 1e-6, "A"},    {"V", 1, "V"},
-    {"mV", 1e-3, "V"},    {"µV", 1e-6, "V"}, {"Hz", 1, "Hz"},      {"kHz", 1e3, "Hz"},
-    {"MHz", 1e6, "Hz"},   {"°C", 1, "°C"},   {"m°C", 1e-3, "°C"}};
+constexpr std::string_view kSize = "B", kTime = "s";
+
+constexpr ScaledUnit kScaledUnits[] = {{"bytes", 1, kSize},
+                                       {"KiB", 0x1p10, kSize},
+                                       {"MiB", 0x1p20, kSize},
+                                       {"nanoseconds", 1e-9, kTime},
+                                       {"microseconds", 1e-6, kTime},
+                                       {"milliseconds", 1e-3, kTime},
+                                       {"seconds", 1, kTime},
+                                       {"minutes", 60, kTime},
+                                       {"hours", 3600, kTime},
+                                       {"degrees Celsius", 1, "°C"},
+                                       {"thousandths of a degree Celsius", 1e-3, "°C"},
+                                       {"millivolts", 1e-3, "V"},
+                                       {"microvolts", 1e-6, "V"},
+                                       {"milliamperes", 1e-3, "A"},
+                                       {"microamperes", 1e-6, "A"},
+                                       {"microwatts", 1e-6, "W"},
+                                       {"microjoules", 1e-6, "J"}};
+
+// Units of figures that are read without one.
+constexpr std::string_view kPlainUnits[] = {"", "count", "number", "state", "mask"};
 
 std::string timeText(double seconds) {
   constexpr double kMinute = 60, kHour = 3600, kDay = 86'400;
@@ -70,14 +88,15 @@ std::string shortNumber(std::int64_t value) {
 }
 
 std::string figureText(double value, std::string_view unit) {
-  if (unit.empty()) return shortNumber(value);
+  if (std::ranges::find(kPlainUnits, unit) != std::end(kPlainUnits)) return shortNumber(value);
+  if (unit == "percent") return shortNumber(value) + kBlank + "%";
   for (const ScaledUnit& scaled : kScaledUnits) {
     if (scaled.name != unit) continue;
-    if (scaled.base == "B") return sizeText(value * scaled.factor);
-    if (scaled.base == "s") return timeText(value * scaled.factor);
+    if (scaled.base == kSize) return sizeText(value * scaled.factor);
+    if (scaled.base == kTime) return timeText(value * scaled.factor);
     return quantityText(value * scaled.factor, scaled.base);
   }
-  return shortNumber(value) + (unit == "%" ? "\u00A0" : " ") + std::string(unit);
+  return shortNumber(value) + " " + std::string(unit);
 }
 
 }  // namespace tavrel::page

@@ -12,8 +12,9 @@ namespace tavrel::page {
 std::string shortNumber(double value);
 std::string shortNumber(std::int64_t value);
 
-/// The same with its unit. Sizes, times and other SI units get prefixes (base/quantity_text.h):
-/// "1.5 GiB", "12.5 ms", "41.3 °C". Other units stand behind the number: "12 %", "3 starts".
+/// The same with its unit, as catalogue/ names units. Sizes, times and electrical units get
+/// prefixes: "1.5 GiB", "12.5 ms", "3.2 days", "41.3 °C". Percentages are "12 %", counts have no
+/// unit, and other units stand behind the number.
 std::string figureText(double value, std::string_view unit);
 
 }  // namespace tavrel::page
