@@ -21,7 +21,7 @@
 #include "tools/log/log_document.h"
 #include "tools/log/log_faults.h"
 #include "tools/log/log_list.h"
-#include "tools/overlay/overlay_platform.h"
+#include "tools/log/log_preview.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/table.h"
@@ -108,29 +108,16 @@ void show(ToolContext& context, const Arguments& arguments) {
   showText(context, *envelope, *bytes);
 }
 
-plist::Dictionary metadataOf(Platform& platform, const CapturedLog& log) {
-  plist::Dictionary metadata{{kLogMetadataType, log.type},
-                             {kLogMetadataName, log.name},
-                             {kLogMetadataVersion, platform.submission->ZTXOSVersion()}};
-  if (log.options) metadata.set(kLogMetadataOptions, log.options);
+plist::Dictionary metadataOf(const LogPreview& preview) {
+  plist::Dictionary metadata{{kLogMetadataType, preview.log->type},
+                             {kLogMetadataName, preview.log->name},
+                             {kLogMetadataVersion, preview.osVersion}};
+  if (preview.log->options) metadata.set(kLogMetadataOptions, preview.log->options);
   return metadata;
 }
 
 void preview(ToolContext& context, const Arguments& arguments) {
-  OverlayPlatform overlay(context.linuxPlatform());
-  Platform& platform = overlay.platform();
-  // An incomplete document must not look like a whole one.
-  std::vector<std::string> errors;
-  overlay.setEventHandler([&](const OverlayEvent& event) {
-    if (event.kind != OverlayEvent::Kind::LogLine) return;
-    const std::string_view message = *event.value.string();
-    if (arguments.verbose) {
-      context.error() << event.subject << ": " << printable(message) << '\n';
-    } else if (event.subject == "error") {
-      errors.emplace_back(message);
-    }
-  });
-  const std::int32_t today = platform.statistics->BHDaysSince1970();
+  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
   std::int32_t day = previousDay(today);
   if (!arguments.day.empty()) {
     const auto parsed = parseDay(arguments.day, today);
@@ -138,30 +125,32 @@ void preview(ToolContext& context, const Arguments& arguments) {
     day = *parsed;
   }
 
-  const LogOutcome outcome = BHReport(platform).writeLogForYesterday(day, {});
-  if (overlay.logs().empty()) {
-    const std::string_view reason = overlay.lastError();
-    if (!errors.empty()) errors.pop_back();
-    for (const std::string& error : errors)
-      context.note(error);
-    return context.fail(format("no log would be submitted for day %s: %s", dayText(day),
-                               reason.empty() ? whyNoLog(outcome) : reason));
+  std::function<void(std::string_view, std::string_view)> onLine;
+  if (arguments.verbose) {
+    onLine = [&context](std::string_view level, std::string_view message) {
+      context.error() << level << ": " << printable(message) << '\n';
+    };
   }
-  for (const std::string& error : errors)
+  const LogPreview preview = previewLog(context, day, onLine);
+  // An incomplete document must not look like a whole one.
+  for (const std::string& error : preview.errors)
     context.note(error);
+  if (!preview.log) {
+    return context.fail(
+        format("no log would be submitted for day %s: %s", dayText(day), preview.reason));
+  }
   const SubmissionPermission permission = submissionPermission(context.preferences());
   if (permission.isGiven && !permission.covers(day)) {
     context.note(format("not submitted: this is day %s, and submission is %s", dayText(day),
                         textOf(permission)));
   }
-  const CapturedLog& log = overlay.logs().back();
   if (!context.json()) {
-    context.out() << log.bytes;
+    context.out() << preview.log->bytes;
     return;
   }
-  const auto value = plist::read(asBytes(log.bytes));
+  const auto value = plist::read(asBytes(preview.log->bytes));
   if (!value) return context.fail(format("preview: %s", value.error().message));
-  showDocument(context, {"preview", "", metadataOf(platform, log)}, value->dictionary());
+  showDocument(context, {"preview", "", metadataOf(preview)}, value->dictionary());
 }
 
 }  // namespace

@@ -1,0 +1,35 @@
+#include "tools/log/log_preview.h"
+
+#include "platform/linux/linux_platform.h"
+#include "report/bh_report.h"
+#include "tools/overlay/overlay_platform.h"
+
+namespace tavrel {
+
+LogPreview previewLog(
+    ToolContext& context, std::int32_t day,
+    const std::function<void(std::string_view level, std::string_view message)>& onLine) {
+  OverlayPlatform overlay(context.linuxPlatform());
+  LogPreview preview;
+  overlay.setEventHandler([&](const OverlayEvent& event) {
+    if (event.kind != OverlayEvent::Kind::LogLine) return;
+    const std::string_view message = *event.value.string();
+    if (onLine) {
+      onLine(event.subject, message);
+    } else if (event.subject == "error") {
+      preview.errors.emplace_back(message);
+    }
+  });
+  preview.osVersion = overlay.platform().submission->ZTXOSVersion();
+  const LogOutcome outcome = BHReport(overlay.platform()).writeLogForYesterday(day, {});
+  if (!overlay.logs().empty()) {
+    preview.log = overlay.logs().back();
+    return preview;
+  }
+  preview.reason = overlay.lastError();
+  if (preview.reason.empty()) preview.reason = whyNoLog(outcome);
+  if (!preview.errors.empty()) preview.errors.pop_back();
+  return preview;
+}
+
+}  // namespace tavrel

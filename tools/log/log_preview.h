@@ -1,0 +1,29 @@
+// The log of a day, made by the daemon's own code without changing anything.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "report/log_outcome.h"
+#include "tools/overlay/overlay_writes.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+struct LogPreview {
+  std::optional<CapturedLog> log;   // permission given or not; nothing when none would be made
+  std::string reason;               // why there is none
+  std::vector<std::string> errors;  // that making it logged; the log may then lack something
+  std::string osVersion;
+};
+
+/// `onLine`, when given, takes each line for the system log; errors are then not kept.
+LogPreview previewLog(
+    ToolContext& context, std::int32_t day,
+    const std::function<void(std::string_view level, std::string_view message)>& onLine = {});
+
+}  // namespace tavrel
