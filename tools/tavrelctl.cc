@@ -22,6 +22,7 @@
 #include "tools/log/log_commands.h"
 #include "tools/log/nandlog_commands.h"
 #include "tools/nand/nand_commands.h"
+#include "tools/page/page_command.h"
 #include "tools/plist/plist_commands.h"
 #include "tools/records/records_commands.h"
 #include "tools/rehearsal/rehearse_command.h"
@@ -97,6 +98,7 @@ constexpr Subcommand kSubcommands[] = {
     {"limits", addLimitsCommand},
     {"tidy", addTidyCommand},
     {"export", addExportCommands},
+    {"page", addPageCommand},
 };
 
 // It describes all other commands, so it comes with them.

@@ -1,0 +1,152 @@
+// The device itself: the head of the page, its health, and notes on the page.
+#include <nlohmann/json.hpp>
+
+#include "base/format.h"
+#include "base/version.h"
+#include "page/number_text.h"
+#include "page/table.h"
+#include "platform/linux/preferences/file_preferences.h"
+#include "platform/platform.h"
+#include "tools/log/log_conclusion.h"
+#include "tools/page/sections.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+void fact(page::HtmlWriter& html, std::string_view term, std::string_view text,
+          std::string_view style = {}) {
+  html.begin("div");
+  html.element("dt", term);
+  html.begin("dd", {{"class", style}});
+  html.name(text);
+  html.end();
+  html.end();
+}
+
+std::string_view styleOf(CheckState state) {
+  switch (state) {
+    case CheckState::Ok:
+      return "good";
+    case CheckState::Critical:
+      return "bad";
+    case CheckState::Warning:
+    case CheckState::Unknown:
+      break;
+  }
+  return "warn";
+}
+
+std::string_view wordOf(CheckState state) {
+  switch (state) {
+    case CheckState::Ok:
+      return "Good";
+    case CheckState::Warning:
+      return "Warning";
+    case CheckState::Critical:
+      return "Critical";
+    case CheckState::Unknown:
+      break;
+  }
+  return "Unknown";
+}
+
+std::string capitalized(std::string text) {
+  if (!text.empty() && text[0] >= 'a' && text[0] <= 'z') text[0] = static_cast<char>(text[0] - 32);
+  return text;
+}
+
+// "permission", "queue outbox", "disk nvme0".
+std::string titleOf(const Check& check) {
+  std::string title(check.name);
+  if (!check.subject.empty()) title += ' ' + check.subject;
+  return capitalized(std::move(title));
+}
+
+std::string queuesText(const std::vector<Check>& checks) {
+  std::string text;
+  for (const Check& check : checks) {
+    if (check.name != "queue" || check.text == "empty") continue;
+    appendFormat(text, "%s%s: %s", text.empty() ? "" : "; ", check.subject, check.text);
+  }
+  return text.empty() ? "All empty" : capitalized(std::move(text));
+}
+
+void writeVerdict(page::HtmlWriter& html, const std::vector<Check>& checks) {
+  std::uint64_t counts[4] = {};
+  CheckState state = CheckState::Ok;
+  for (const Check& check : checks) {
+    ++counts[static_cast<std::size_t>(check.state)];
+    state = graver(state, check.state);
+  }
+  std::string text;
+  constexpr const char* kWords[] = {"", "warning", "critical", "unknown"};
+  for (const CheckState bad : {CheckState::Critical, CheckState::Warning, CheckState::Unknown}) {
+    const auto index = static_cast<std::size_t>(bad);
+    if (counts[index] == 0) continue;
+    appendFormat(text, "%s%llu %s", text.empty() ? "" : ", ", counts[index], kWords[index]);
+  }
+  fact(html, "Checks",
+       text.empty() ? format("All %zu good", checks.size())
+                    : format("%s, of %zu", text, checks.size()),
+       styleOf(state));
+}
+
+}  // namespace
+
+void writeHead(PageScene& scene, const std::vector<Check>& checks) {
+  page::HtmlWriter& html = scene.document.head();
+  const SubmissionPermission permission = submissionPermission(scene.context.preferences());
+  html.begin("dl");
+  fact(html, "System", scene.osVersion.empty() ? "Not known" : scene.osVersion);
+  fact(html, "tavrel", std::string(version()));
+  fact(html, "Day of the figures", dayText(scene.recorded.day));
+  fact(html, "Logs may leave the device",
+       permission.isGiven ? capitalized(textOf(permission)) : std::string("Not allowed"),
+       permission.isGiven ? "good" : "warn");
+  fact(html, "Logs that wait", queuesText(checks));
+  writeVerdict(html, checks);
+  html.end();
+}
+
+void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
+  page::HtmlWriter& html = scene.document.section("Health");
+  const LogConclusion conclusion = concludeOnLogs(scene.context);
+  html.element("p", format("The %s run: %s.", conclusion.run(), conclusion.text()));
+  page::Table table(html, "Health", {{"Check", page::Table::Align::Name}, {"State"}, {"Finding"}});
+  for (const Check& check : checks) {
+    table.row();
+    table.cell([&](page::HtmlWriter& cell) { cell.name(titleOf(check)); });
+    table.cell([&](page::HtmlWriter& cell) {
+      cell.element("span", wordOf(check.state), {{"class", styleOf(check.state)}});
+    });
+    table.cell([&](page::HtmlWriter& cell) { cell.name(check.text); });
+  }
+  table.end();
+}
+
+void writeNotes(PageScene& scene) {
+  page::HtmlWriter& html = scene.document.section("About this page");
+  html.element("p",
+               "The figures of this page are exact, also those that leave the device only in a "
+               "coarser form, or not at all: give it only to whom you would give the device. Days "
+               "are those of UTC. Nothing in the page comes from a network, and it sends nothing.");
+  if (!scene.recorded.fault.empty()) {
+    html.begin("p", {{"class", "bad"}});
+    html.name("Something is missing: " + scene.recorded.fault);
+    html.end();
+  }
+}
+
+void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view what,
+                  std::string_view where) {
+  if (count == 0) return;
+  html.begin("p", {{"class", "note"}});
+  html.text(format("There is no room here for %s more: ", counted(count, what)));
+  html.element("code", where);
+  html.text(" has them all.");
+  html.end();
+}
+
+}  // namespace tavrel

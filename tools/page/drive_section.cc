@@ -1,0 +1,155 @@
+// Drives: their wear, how long they may last, and all that they tell.
+#include <algorithm>
+#include <cmath>
+#include <optional>
+
+#include "base/format.h"
+#include "base/quantity_text.h"
+#include "page/charts.h"
+#include "page/number_text.h"
+#include "page/table.h"
+#include "tools/disks/disk_list.h"
+#include "tools/page/sections.h"
+
+namespace tavrel {
+namespace {
+
+using namespace health;
+
+constexpr SectionLimit kDriveLimit{32, 200'000};
+
+std::optional<std::int64_t> figureOf(const Disk& disk, std::string_view name) {
+  const std::int64_t* const value = valueOf(disk.reading.figures, name);
+  return value ? std::optional(*value) : std::nullopt;
+}
+
+struct Wear {
+  std::string_view figure;
+  std::int64_t percent = 0;
+};
+
+std::optional<Wear> wearOf(const Disk& disk) {
+  std::optional<Wear> wear;
+  for (const std::string_view name : {"used_pct", "life_a_pct", "life_b_pct"}) {
+    const auto percent = figureOf(disk, name);
+    if (percent && (!wear || *percent > wear->percent)) wear = Wear{name, *percent};
+  }
+  return wear;
+}
+
+/// Days after which the drive is worn out, if it goes on being worn as it was.
+std::optional<double> daysLeft(double percentUsed, double inDays, double percentNow) {
+  if (percentUsed <= 0 || inDays <= 0) return std::nullopt;
+  return std::max(100 - percentNow, 0.0) * inDays / percentUsed;
+}
+
+// Of the figure that the daily run stored, over the days of the page.
+std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear) {
+  const auto known = scene.recorded.scalars.find(
+      format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
+  if (known == scene.recorded.scalars.end() || known->second.days.size() < 2) return std::nullopt;
+  const auto& [firstDay, first] = *known->second.days.begin();
+  const auto& [lastDay, last] = *known->second.days.rbegin();
+  return daysLeft(static_cast<double>(last) - static_cast<double>(first),
+                  static_cast<double>(lastDay) - firstDay, static_cast<double>(wear.percent));
+}
+
+std::string yearsText(double days) {
+  constexpr double kYear = 365.25;
+  if (days < 2 * kYear) return format("%s days", page::shortNumber(std::round(days)));
+  return days < 100 * kYear ? format("%s years", page::shortNumber(std::round(days / kYear)))
+                            : std::string("more than 100 years");
+}
+
+std::string lifetimeText(const PageScene& scene, const Disk& disk) {
+  const auto wear = wearOf(disk);
+  if (!wear) return "Not known: the drive tells no wear";
+  if (wear->percent >= 100) return "Its rated life is used up";
+  // The pace of late says more than that of the whole life, and needs no hours.
+  if (const auto days = daysLeftByTrend(scene, disk, *wear))
+    return format("About %s at the pace of the days on this page", yearsText(*days));
+  constexpr double kHoursPerDay = 24;
+  if (const auto hours = figureOf(disk, "power_on_hours"); hours && wear->figure == "used_pct") {
+    const double days = static_cast<double>(*hours) / kHoursPerDay;
+    const auto percent = static_cast<double>(wear->percent);
+    if (const auto left = daysLeft(percent, days, percent))
+      return format("About %s of operation at the pace of its life so far", yearsText(*left));
+  }
+  return wear->percent == 0 ? "Not known yet: no wear so far"
+                            : "Not known yet: its wear has not changed on these days";
+}
+
+std::string valueText(Unit unit, std::int64_t value) {
+  if (unit == kBytes) return sizeText(static_cast<double>(value));
+  if (unit == kMillidegrees)
+    return page::figureText(static_cast<double>(value), "thousandths of a degree Celsius");
+  return page::shortNumber(value);
+}
+
+void writeDrive(const PageScene& scene, page::HtmlWriter& html, const Disk& disk) {
+  const Reading& reading = disk.reading;
+  html.begin("h3");
+  html.name(reading.name);
+  html.end();
+  html.begin("dl");
+  const auto fact = [&html](std::string_view term, std::string_view text,
+                            std::string_view style = {}) {
+    html.begin("div");
+    html.element("dt", term);
+    html.begin("dd", {{"class", style}});
+    html.name(text);
+    html.end();
+    html.end();
+  };
+  std::string verdict = disk.verdict.word();
+  for (const std::string& reason : disk.verdict.reasons)
+    verdict += ", " + reason;
+  const bool isGrave = (disk.verdict.problems & kFailing) != 0;
+  fact("Verdict", verdict, disk.verdict.problems == 0 ? "good" : isGrave ? "bad" : "warn");
+  if (!reading.model.empty()) fact("Model", reading.model);
+  if (!reading.firmware.empty()) fact("Firmware", reading.firmware);
+  if (reading.capacity) fact("Capacity", sizeText(static_cast<double>(*reading.capacity)));
+  fact("Read", ageText(disk.age) + " ago");
+  fact("Life left", lifetimeText(scene, disk));
+  html.end();
+  if (const auto wear = wearOf(disk)) {
+    const double used = std::clamp(static_cast<double>(wear->percent) / 100, 0.0, 1.0);
+    const page::Share shares[] = {{"used", used, {}}, {"left", 1 - used, {}}};
+    page::writeShares(html, format("Wear of %s", reading.name), shares);
+  }
+  const std::vector<NamedFigure> figures = figuresOf({reading});
+  if (figures.empty()) return;
+  page::Table table(
+      html, format("Figures of %s", reading.name),
+      {{"Figure", page::Table::Align::Name}, {"Value", page::Table::Align::Number}, {"Meaning"}});
+  for (const NamedFigure& figure : figures) {
+    table.row();
+    table.cell([&](page::HtmlWriter& cell) { cell.name(figure.name); });
+    table.cell(valueText(figure.unit, figure.value));
+    table.cell(figure.meaning);
+  }
+  table.end();
+}
+
+}  // namespace
+
+void writeDrives(PageScene& scene) {
+  page::HtmlWriter& html = scene.document.section("Drives");
+  const auto [disks, faults] = findDisks(scene.context);
+  for (const Error& fault : faults) {
+    scene.context.fail(fault.message);
+    html.begin("p", {{"class", "warn"}});
+    html.name(fault.message);
+    html.end();
+  }
+  if (disks.empty()) {
+    html.element("p", "No drive of this device tells its health.");
+    return;
+  }
+  std::size_t written = 0;
+  for (; written < disks.size() && !kDriveLimit.isReached(written, html); ++written)
+    writeDrive(scene, html, disks[written]);
+  writeLeftOut(html, disks.size() - written, "drive", "tavrelctl disks --all");
+}
+
+}  // namespace tavrel

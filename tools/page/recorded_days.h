@@ -1,0 +1,46 @@
+// What a device recorded on some days, by key.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <map>
+#include <optional>
+#include <string>
+#include <vector>
+
+#include "tools/shared/distribution_view.h"
+#include "tools/shared/tool_context.h"
+#include "tools/stat/value_summary.h"
+
+namespace tavrel {
+
+/// The values of a distribution on the page's day.
+struct DayValues {
+  std::optional<double> median;  // nothing when there are too many values to sort them
+  std::vector<DistributionView::Bucket> buckets;
+};
+
+/// Days are ascending.
+struct RecordedScalar {
+  std::map<std::int32_t, std::int64_t> days;
+};
+struct RecordedDistribution {
+  std::map<std::int32_t, Summary> days;
+  DayValues values;
+};
+
+struct RecordedDays {
+  std::int32_t first = 0;
+  std::int32_t last = 0;  // included
+  std::int32_t day = 0;   // whose figures are shown
+  std::map<std::string, RecordedScalar, std::less<>> scalars;
+  std::map<std::string, RecordedDistribution, std::less<>> distributions;
+  std::string fault;  // why something may be missing; empty when nothing is
+};
+
+/// So many days up to `day`. Without it, up to yesterday, and the day is the last of them that has
+/// statistics; a device that only has earlier or later ones is shown as of its last day.
+RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
+                              std::int32_t days);
+
+}  // namespace tavrel

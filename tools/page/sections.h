@@ -1,0 +1,77 @@
+// The sections of a device's page. Each writes what it knows and says what it leaves out.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/plist.h"
+#include "page/document.h"
+#include "tools/check/check.h"
+#include "tools/page/recorded_days.h"
+#include "tools/shared/distribution_view.h"
+#include "tools/shared/tool_context.h"
+
+namespace tavrel {
+
+/// The log of the page's day, as it would leave the device.
+struct PageLog {
+  std::string reason;         // why there is none; empty when there is one
+  plist::Dictionary scalars;  // an empty handle without a log
+  std::vector<DistributionView> distributions;
+  bool isCovered = false;  // by the owner's permission
+};
+
+/// What all sections share.
+struct PageScene {
+  ToolContext& context;
+  page::Document& document;
+  const RecordedDays& recorded;
+  const PageLog& log;
+  std::string osVersion;
+};
+
+/// How much a section may hold, so that a page stays below 2 MB whatever the device has.
+struct SectionLimit {
+  std::size_t items;
+  std::size_t bytes;
+
+  bool isReached(std::size_t written, const page::HtmlWriter& html) const {
+    return written >= items || html.written().size() >= bytes;
+  }
+};
+
+void writeHead(PageScene& scene, const std::vector<Check>& checks);
+void writeHealth(PageScene& scene, const std::vector<Check>& checks);
+void writeScalars(PageScene& scene);
+void writeDistributions(PageScene& scene);
+void writeTrends(PageScene& scene);
+/// Channels that tell how long states lasted.
+void writeStates(PageScene& scene);
+void writeDrives(PageScene& scene);
+void writeNotes(PageScene& scene);
+
+// -- What several sections need ------------------------------------------------------------------
+
+/// Keys of a map, those that the log has before the others.
+template <class Statistics, class IsInLog>
+std::vector<std::string_view> keysLeavingFirst(const Statistics& statistics,
+                                               const IsInLog& isInLog) {
+  std::vector<std::string_view> keys;
+  for (const bool leaves : {true, false})
+    for (const auto& [key, statistic] : statistics)
+      if (isInLog(key) == leaves) keys.push_back(key);
+  return keys;
+}
+
+/// A key with its meaning below it, as a name heads a row or a card.
+void writeKey(page::HtmlWriter& html, std::string_view key);
+/// The unit that the catalogue has for a key; empty when it is not known.
+std::string_view unitOf(std::string_view key);
+/// "a sentence with the count of what was left out", as a note; nothing for 0.
+void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view what,
+                  std::string_view where);
+
+}  // namespace tavrel

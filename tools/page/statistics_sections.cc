@@ -1,0 +1,235 @@
+// The statistics of the day, exact and as they leave the device.
+#include <algorithm>
+#include <cmath>
+
+#include "base/format.h"
+#include "base/text.h"
+#include "catalogue/catalogue.h"
+#include "page/charts.h"
+#include "page/number_text.h"
+#include "page/table.h"
+#include "tools/page/sections.h"
+#include "tools/shared/day_argument.h"
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+using page::figureText;
+using page::shortNumber;
+
+constexpr SectionLimit kScalarLimit{1000, 400'000};
+constexpr SectionLimit kDistributionLimit{100, 400'000};
+
+constexpr const char* kStays = "Stays on the device";
+
+// What the log's column shows, whatever type the value has.
+std::string coarseText(const plist::Value& value, std::string_view unit) {
+  const auto number = value.number();
+  if (!number) return textOf(value);
+  if (!number->isFloating()) return shortNumber(number->int64());
+  return figureText(number->real(), unit);
+}
+
+// A scalar of the day and of its log; one of them may be missing.
+struct ScalarRow {
+  std::string_view key;
+  std::optional<std::int64_t> exact;
+  plist::Value coarse;
+};
+
+std::vector<ScalarRow> scalarRows(const PageScene& scene) {
+  std::map<std::string_view, ScalarRow> rows;
+  for (const auto& [key, scalar] : scene.recorded.scalars) {
+    const auto day = scalar.days.find(scene.recorded.day);
+    if (day != scalar.days.end()) rows[key] = {key, day->second, {}};
+  }
+  for (const plist::Entry& entry : scene.log.scalars) {
+    ScalarRow& row = rows[entry.key.view()];
+    row.key = entry.key.view();
+    row.coarse = entry.value;
+  }
+  std::vector<ScalarRow> list;
+  for (const bool leaves : {true, false})
+    for (const auto& [key, row] : rows)
+      if (row.coarse.isNull() != leaves) list.push_back(row);
+  return list;
+}
+
+void writeScalarRow(page::Table& table, const ScalarRow& row) {
+  const std::string_view unit = unitOf(row.key);
+  table.row();
+  table.cell([&](page::HtmlWriter& cell) { writeKey(cell, row.key); });
+  table.cell(row.exact ? shortNumber(*row.exact) : "measured for the log");
+  table.cell([&](page::HtmlWriter& cell) {
+    if (row.coarse.isNull()) {
+      cell.element("small", kStays);
+    } else {
+      cell.text(coarseText(row.coarse, ""));
+    }
+  });
+  table.cell(unit);
+}
+
+void writeNoDay(const PageScene& scene, page::HtmlWriter& html, std::string_view what) {
+  html.element("p",
+               format("The device recorded no %s on %s.", what, dayDateText(scene.recorded.day)));
+}
+
+// What the log of the day means for the figures of a section.
+void writeLogState(const PageScene& scene, page::HtmlWriter& html, std::uint64_t leaving,
+                   std::uint64_t all, std::string_view what) {
+  std::string text;
+  if (!scene.log.reason.empty()) {
+    text = format("Nothing leaves the device: there is no log of this day, because %s.",
+                  scene.log.reason);
+  } else {
+    text = format("Of %s, %llu %s in the log of this day", counted(all, what), leaving,
+                  leaving == 1 ? "is" : "are");
+    text += scene.log.isCovered
+                ? ", in the coarser form that is shown. The owner allows it to leave the device."
+                : ", in the coarser form that is shown. It stays here: the owner has not allowed "
+                  "it to leave the device.";
+  }
+  html.begin("p");
+  html.name(text);
+  html.end();
+}
+
+std::string rangeText(const Summary& summary, std::string_view unit) {
+  return format("%s to %s", figureText(summary.minimum(), unit),
+                figureText(summary.maximum(), unit));
+}
+
+// The two ends of a label such as "(10, 20]".
+std::pair<std::string, std::string> endsOf(const std::string& label) {
+  const std::size_t comma = label.find(", ");
+  if (comma == std::string::npos || label.size() < 2) return {label, label};
+  return {label.substr(1, comma - 1), label.substr(comma + 2, label.size() - comma - 3)};
+}
+
+void writeDayHistogram(page::HtmlWriter& html, std::string_view key, const DayValues& values) {
+  if (values.buckets.empty()) return;
+  page::Histogram histogram{std::string(key), {}, {}, {}};
+  for (const auto& bucket : values.buckets)
+    histogram.cells.push_back({bucket.label, static_cast<double>(bucket.count)});
+  histogram.lowest = endsOf(values.buckets.front().label).first;
+  histogram.highest = endsOf(values.buckets.back().label).second;
+  writeHistogram(html, histogram);
+}
+
+void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) {
+  html.begin("p", {{"class", "note leaves"}});
+  if (leaving == nullptr) {
+    html.text(kStays);
+    html.end();
+    return;
+  }
+  html.text(leaving->buckets.empty()
+                ? "Leaves as count, lowest, highest, mean and deviation"
+                : "Leaves as count, lowest, highest, mean and deviation, and as these counts");
+  html.end();
+  std::vector<page::Bar> bars;
+  for (const auto& bucket : leaving->buckets) {
+    const auto count = static_cast<double>(bucket.count);
+    bars.push_back({bucket.label, count, shortNumber(count)});
+  }
+  if (!bars.empty()) writeBars(html, format("Intervals of %s", leaving->key), bars);
+}
+
+void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summary& summary,
+                       const DayValues& values, const DistributionView* leaving) {
+  const std::string_view unit = unitOf(key);
+  html.begin("article", {{"class", "card"}});
+  html.begin("h3");
+  writeKey(html, key);
+  html.end();
+  html.begin("dl", {{"class", "figures"}});
+  const auto figure = [&html](std::string_view term, std::string_view text) {
+    html.begin("div");
+    html.element("dt", term);
+    html.element("dd", text);
+    html.end();
+  };
+  figure("Values", shortNumber(summary.count()));
+  if (summary.numbers() > 0) {
+    figure("Range", rangeText(summary, unit));
+    if (values.median) figure("Median", figureText(*values.median, unit));
+    figure("Mean", figureText(summary.mean(), unit));
+  }
+  html.end();
+  writeDayHistogram(html, key, values);
+  writeLogHistogram(html, leaving);
+  html.end();
+}
+
+}  // namespace
+
+void writeKey(page::HtmlWriter& html, std::string_view key) {
+  html.name(key);
+  if (const auto* entry = catalogue::findStatistic(key); entry && !entry->meaning.empty())
+    html.element("small", entry->meaning);
+}
+
+std::string_view unitOf(std::string_view key) {
+  const auto* entry = catalogue::findStatistic(key);
+  return entry ? entry->unit : std::string_view();
+}
+
+void writeScalars(PageScene& scene) {
+  page::HtmlWriter& html = scene.document.section("Scalars of the day");
+  const std::vector<ScalarRow> rows = scalarRows(scene);
+  if (rows.empty()) return writeNoDay(scene, html, "scalar");
+  const auto stays = [](const ScalarRow& row) { return row.coarse.isNull(); };
+  const auto leaving = rows.size() - static_cast<std::size_t>(std::ranges::count_if(rows, stays));
+  writeLogState(scene, html, leaving, rows.size(), "scalar");
+  constexpr auto kNumber = page::Table::Align::Number;
+  page::Table table(html, "Scalars",
+                    {{"Statistic", page::Table::Align::Name},
+                     {"Exact", kNumber},
+                     {"Leaves as", kNumber},
+                     {"Unit"}});
+  std::size_t written = 0;
+  for (; written < rows.size() && !kScalarLimit.isReached(written, html); ++written)
+    writeScalarRow(table, rows[written]);
+  table.end();
+  writeLeftOut(html, rows.size() - written, "scalar",
+               format("tavrelctl stat list --day %s", dayDateText(scene.recorded.day)));
+}
+
+void writeDistributions(PageScene& scene) {
+  page::HtmlWriter& html = scene.document.section("Distributions of the day");
+  std::map<std::string_view, const DistributionView*> leaving;
+  for (const DistributionView& view : scene.log.distributions)
+    leaving[view.key] = &view;
+  struct Row {
+    std::string_view key;
+    const Summary* summary;
+    const DayValues* values;
+  };
+  std::vector<Row> rows;
+  for (const std::string_view key :
+       keysLeavingFirst(scene.recorded.distributions,
+                        [&](std::string_view name) { return leaving.contains(name); })) {
+    const RecordedDistribution& recorded = scene.recorded.distributions.find(key)->second;
+    const auto day = recorded.days.find(scene.recorded.day);
+    if (day != recorded.days.end()) rows.push_back({key, &day->second, &recorded.values});
+  }
+  if (rows.empty()) return writeNoDay(scene, html, "distribution");
+  const auto leaves =
+      std::ranges::count_if(rows, [&](const Row& row) { return leaving.contains(row.key); });
+  writeLogState(scene, html, static_cast<std::uint64_t>(leaves), rows.size(), "distribution");
+  html.begin("div", {{"class", "cards"}});
+  std::size_t written = 0;
+  for (; written < rows.size() && !kDistributionLimit.isReached(written, html); ++written) {
+    const Row& row = rows[written];
+    const auto view = leaving.find(row.key);
+    writeDistribution(html, row.key, *row.summary, *row.values,
+                      view == leaving.end() ? nullptr : view->second);
+  }
+  html.end();
+  writeLeftOut(html, rows.size() - written, "distribution",
+               format("tavrelctl stat list --day %s", dayDateText(scene.recorded.day)));
+}
+
+}  // namespace tavrel
