@@ -33,6 +33,8 @@ void Table::beginCell() {
     html_.begin("th", {{"scope", "row"}});
   } else if (column.align == Align::Number) {
     html_.begin("td", {{"class", "number"}, {"data-title", column.title}});
+  } else if (column.align == Align::Plain) {
+    html_.begin("td");
   } else {
     html_.begin("td", {{"data-title", column.title}});
   }

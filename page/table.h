@@ -20,8 +20,9 @@ namespace tavrel::page {
 
 class Table {
  public:
-  /// Names head their row; numbers stand flush right.
-  enum class Align : std::uint8_t { Text, Number, Name };
+  /// Names head their row; numbers stand flush right; plain texts speak for themselves and need no
+  /// title beside them on a card.
+  enum class Align : std::uint8_t { Text, Number, Name, Plain };
   struct Column {
     std::string title;
     Align align = Align::Text;

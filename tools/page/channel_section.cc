@@ -85,8 +85,7 @@ void writeStates(PageScene& scene) {
     const std::string_view driver = textOr(IOReportChannelGetDriverName(channel));
     const std::string_view group = textOr(IOReportChannelGetGroup(channel));
     const std::string_view name = textOr(IOReportChannelGetChannelName(channel));
-    html.begin("article", {{"class", "card"}});
-    html.begin("h3");
+    beginCard(html, name);
     html.name(name);
     const auto* entry = catalogue::findChannel(driver, group, name);
     if (entry && !entry->meaning.empty()) html.element("small", entry->meaning);

@@ -1,4 +1,5 @@
 // The device itself: the head of the page, its health, and notes on the page.
+#include <algorithm>
 #include <nlohmann/json.hpp>
 
 #include "base/format.h"
@@ -60,8 +61,14 @@ std::string capitalized(std::string text) {
 // "permission", "queue outbox", "disk nvme0".
 std::string titleOf(const Check& check) {
   std::string title(check.name);
+  std::ranges::replace(title, '-', ' ');
   if (!check.subject.empty()) title += ' ' + check.subject;
   return capitalized(std::move(title));
+}
+
+std::string permissionText(const SubmissionPermission& permission) {
+  if (!permission.isGiven) return "Not allowed";
+  return permission.firstDay ? format("From %s on", dayDateText(*permission.firstDay)) : "Allowed";
 }
 
 std::string queuesText(const std::vector<Check>& checks) {
@@ -71,6 +78,16 @@ std::string queuesText(const std::vector<Check>& checks) {
     appendFormat(text, "%s%s: %s", text.empty() ? "" : "; ", check.subject, check.text);
   }
   return text.empty() ? "All empty" : capitalized(std::move(text));
+}
+
+std::vector<const Check*> gravestFirst(const std::vector<Check>& checks) {
+  std::vector<const Check*> sorted;
+  for (const CheckState state :
+       {CheckState::Critical, CheckState::Warning, CheckState::Unknown, CheckState::Ok}) {
+    for (const Check& check : checks)
+      if (check.state == state) sorted.push_back(&check);
+  }
+  return sorted;
 }
 
 void writeVerdict(page::HtmlWriter& html, const std::vector<Check>& checks) {
@@ -99,14 +116,13 @@ void writeHead(PageScene& scene, const std::vector<Check>& checks) {
   page::HtmlWriter& html = scene.document.head();
   const SubmissionPermission permission = submissionPermission(scene.context.preferences());
   html.begin("dl");
-  fact(html, "System", scene.osVersion.empty() ? "Not known" : scene.osVersion);
-  fact(html, "tavrel", std::string(version()));
-  fact(html, "Day of the figures", dayText(scene.recorded.day));
-  fact(html, "Logs may leave the device",
-       permission.isGiven ? capitalized(textOf(permission)) : std::string("Not allowed"),
+  writeVerdict(html, checks);
+  fact(html, "Logs may leave the device", permissionText(permission),
        permission.isGiven ? "good" : "warn");
   fact(html, "Logs that wait", queuesText(checks));
-  writeVerdict(html, checks);
+  fact(html, "Day of the figures", dayText(scene.recorded.day));
+  fact(html, "System", scene.osVersion.empty() ? "Not known" : scene.osVersion);
+  fact(html, "tavrel", std::string(version()));
   html.end();
 }
 
@@ -114,8 +130,11 @@ void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
   page::HtmlWriter& html = scene.document.section("Health");
   const LogConclusion conclusion = concludeOnLogs(scene.context);
   html.element("p", format("The %s run: %s.", conclusion.run(), conclusion.text()));
-  page::Table table(html, "Health", {{"Check", page::Table::Align::Name}, {"State"}, {"Finding"}});
-  for (const Check& check : checks) {
+  constexpr auto kPlain = page::Table::Align::Plain;
+  page::Table table(html, "Health",
+                    {{"Check", page::Table::Align::Name}, {"State", kPlain}, {"Finding", kPlain}});
+  for (const Check* const found : gravestFirst(checks)) {
+    const Check& check = *found;
     table.row();
     table.cell([&](page::HtmlWriter& cell) { cell.name(titleOf(check)); });
     table.cell([&](page::HtmlWriter& cell) {

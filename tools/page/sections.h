@@ -66,8 +66,10 @@ std::vector<std::string_view> keysLeavingFirst(const Statistics& statistics,
   return keys;
 }
 
-/// A key with its meaning below it, as a name heads a row or a card.
+/// A key with its meaning below it, as it heads a row.
 void writeKey(page::HtmlWriter& html, std::string_view key);
+/// Begins a card with a heading, which the caller ends; a long key gets a wide one.
+void beginCard(page::HtmlWriter& html, std::string_view key);
 /// The unit that the catalogue has for a key; empty when it is not known.
 std::string_view unitOf(std::string_view key);
 /// "a sentence with the count of what was left out", as a note; nothing for 0.

@@ -24,11 +24,11 @@ constexpr SectionLimit kDistributionLimit{100, 400'000};
 constexpr const char* kStays = "Stays on the device";
 
 // What the log's column shows, whatever type the value has.
-std::string coarseText(const plist::Value& value, std::string_view unit) {
+std::string coarseText(const plist::Value& value) {
   const auto number = value.number();
   if (!number) return textOf(value);
   if (!number->isFloating()) return shortNumber(number->int64());
-  return figureText(number->real(), unit);
+  return shortNumber(number->real());
 }
 
 // A scalar of the day and of its log; one of them may be missing.
@@ -63,12 +63,12 @@ void writeScalarRow(page::Table& table, const ScalarRow& row) {
   table.cell(row.exact ? shortNumber(*row.exact) : "measured for the log");
   table.cell([&](page::HtmlWriter& cell) {
     if (row.coarse.isNull()) {
-      cell.element("small", kStays);
+      cell.element("small", "stays here");
     } else {
-      cell.text(coarseText(row.coarse, ""));
+      cell.text(coarseText(row.coarse));
     }
   });
-  table.cell(unit);
+  table.cell(unit == "count" || unit == "number" ? "" : unit);
 }
 
 void writeNoDay(const PageScene& scene, page::HtmlWriter& html, std::string_view what) {
@@ -140,8 +140,7 @@ void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) 
 void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summary& summary,
                        const DayValues& values, const DistributionView* leaving) {
   const std::string_view unit = unitOf(key);
-  html.begin("article", {{"class", "card"}});
-  html.begin("h3");
+  beginCard(html, key);
   writeKey(html, key);
   html.end();
   html.begin("dl", {{"class", "figures"}});
@@ -169,6 +168,12 @@ void writeKey(page::HtmlWriter& html, std::string_view key) {
   html.name(key);
   if (const auto* entry = catalogue::findStatistic(key); entry && !entry->meaning.empty())
     html.element("small", entry->meaning);
+}
+
+void beginCard(page::HtmlWriter& html, std::string_view key) {
+  constexpr std::size_t kWide = 120;
+  html.begin("article", {{"class", key.size() > kWide ? "card wide" : "card"}});
+  html.begin("h3");
 }
 
 std::string_view unitOf(std::string_view key) {

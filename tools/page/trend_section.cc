@@ -71,8 +71,7 @@ class Trends {
 
 void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& trend) {
   const std::string_view unit = unitOf(trend.key);
-  html.begin("article", {{"class", "card"}});
-  html.begin("h3");
+  beginCard(html, trend.key);
   writeKey(html, trend.key);
   html.end();
   writeLineChart(html, {std::string(trend.key), trend.values, trend.lows, trend.highs,
