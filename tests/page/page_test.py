@@ -1,0 +1,84 @@
+#!/usr/bin/env python3
+"""Opens pages in headless Chromium and looks for faults that readers would see.
+
+    page_test.py TAVRELCTL EXAMPLES
+"""
+
+import os
+import sys
+import tempfile
+
+from browser import Browser
+from device import HOSTILE, LONG, OVERRIDE, SCRIPT, Device
+
+HERE = os.path.dirname(os.path.abspath(__file__))
+WIDTHS = (320, 768, 1920)
+
+with open(os.path.join(HERE, "inspect.js"), encoding="utf-8") as source:
+    INSPECT = source.read()
+
+# The cells of a scalar by its key.
+ROWS = """Object.fromEntries([...document.querySelectorAll('table[aria-label=Scalars] tbody tr')].map(
+    row => [row.querySelector('bdi').textContent, [...row.cells].slice(1).map(c => c.textContent)]))"""
+
+
+def expect(actual, expected, what):
+    if actual != expected:
+        raise AssertionError(f"{what}: {actual!r}, expected {expected!r}")
+
+
+def inspect(browser, file, charts):
+    """Faults at all widths in both colour schemes. `charts` is how many there are."""
+    for width in WIDTHS:
+        for scheme in ("light", "dark"):
+            what = f"{os.path.basename(file)}, {width} pixels, {scheme}"
+            browser.open(file, width, scheme)
+            expect(browser.evaluate(INSPECT), [], what)
+            requests = [event["params"]["request"]["url"] for event in browser.events
+                        if event.get("method") == "Network.requestWillBeSent"]
+            expect(requests, ["file://" + file], what + ": requests")
+    nodes = browser.call("Accessibility.getFullAXTree")["nodes"]
+    names = [node["name"]["value"] for node in nodes
+             if not node["ignored"] and node["role"]["value"] in ("img", "image")]
+    expect((len(names), [name for name in names if ": " not in name]), (charts, []), "named charts")
+
+
+def check_content(browser):
+    expect(browser.evaluate("document.title").startswith("Device on "), True, "title")
+    text = browser.evaluate("document.body.textContent")
+    expect([key for key in HOSTILE if key not in text], [], "hostile keys as text")
+    rows = browser.evaluate(ROWS)
+    blank = "\u202f"
+    million = f"1{blank}234{blank}567"
+    for key, cells in ((SCRIPT, [million, f"1{blank}000{blank}000", ""]),
+                       (OVERRIDE, [million, million, ""]), (LONG, [million, "stays here", ""]),
+                       ("com.norvane.usage.disk.free_mib", [f"73{blank}520", "stays here", "MiB"])):
+        expect(rows.get(key), cells, key[:40])
+    # The direction of a hostile key ends with it.
+    expect(browser.evaluate(f"""[...document.querySelectorAll('bdi')].filter(
+        name => name.textContent === {OVERRIDE!r}).length"""), 2, "isolated names")
+    for words in ("About 6 years at the pace of the days on this page", "ACTV",
+                  "Trends over 30 days", "worn, pre_eol is 2", "From 20"):
+        expect(words in text, True, words)
+
+
+def main():
+    tool, examples = map(os.path.abspath, sys.argv[1:])
+    with tempfile.TemporaryDirectory(prefix="tavrel_page.") as folder, Browser() as browser:
+        device = Device(os.path.join(folder, "device"), tool)
+        os.mkdir(device.root)
+        page = os.path.join(folder, "page.html")
+        device.run("page", "-o", page, "--days", "3")
+        inspect(browser, page, 0)
+        device.furnish(examples)
+        device.statistics(30, hole=(5, 6, 7, 20))
+        device.run("page", "-o", page)
+        # 3 histograms, 5 bars of the log, 14 trends, a channel, 2 drives.
+        inspect(browser, page, 25)
+        check_content(browser)
+        expect(device.run("page", "-o", "-").stdout.count("</html>"), 1, "standard output")
+    print("no faults")
+
+
+if __name__ == "__main__":
+    main()
