@@ -55,6 +55,7 @@ void HtmlWriter::tag(const char* element, Attributes attributes, std::string_vie
   out_ += '<';
   out_ += element;
   for (const Attribute& attribute : attributes) {
+    if (attribute.value.empty()) continue;
     out_ += ' ';
     out_ += attribute.name;
     out_ += "=\"";

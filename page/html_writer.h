@@ -18,7 +18,7 @@
 
 namespace tavrel::page {
 
-/// Borrows both.
+/// Borrows both. An attribute without a value is left out.
 struct Attribute {
   std::string_view name;
   std::string_view value;

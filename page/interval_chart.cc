@@ -62,13 +62,17 @@ void writeIntervals(HtmlWriter& html, const IntervalChart& chart) {
   for (const IntervalChart::Row& row : chart.rows)
     writeRow(html, chart, row, scale);
   html.end();
-  html.begin("p", {{"class", "scale"}});
+  html.begin("div", {{"class", "scale"}});
+  html.begin("p");
   html.element("span", chart.text(scale.low));
-  if (scale.low < chart.reference && chart.reference < scale.high) {
-    const std::string place = format("left:%.1f%%", 100.0 * scale.at(chart.reference) / kLength);
-    html.element("span", chart.text(chart.reference), {{"class", "at"}, {"style", place}});
+  // Near an end its label would be in the way.
+  const double reference = static_cast<double>(scale.at(chart.reference)) / kLength;
+  if (reference > 0.2 && reference < 0.8) {
+    html.element("span", chart.text(chart.reference),
+                 {{"class", "at"}, {"style", format("left:%.1f%%", 100 * reference)}});
   }
   html.element("span", chart.text(scale.high));
+  html.end();
   html.end();
   html.end();
 }

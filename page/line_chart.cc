@@ -113,7 +113,7 @@ void writeLineChart(HtmlWriter& html, const LineChart& chart) {
   range.take(chart.highs);
   const std::size_t width = std::max<std::size_t>(chart.values.size(), 2) - 1;
   html.begin("div", {{"class", "line"}});
-  html.element("span", range.told == 0 ? "" : chart.text(range.high), {{"class", "top"}});
+  html.element("span", range.told == 0 ? "none" : chart.text(range.high), {{"class", "top"}});
   if (range.low != range.high) html.element("span", chart.text(range.low), {{"class", "bottom"}});
   html.begin("svg", {{"role", "img"},
                      {"aria-label", nameOf(chart, line)},

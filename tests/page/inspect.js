@@ -7,7 +7,8 @@
 
   for (const element of document.querySelectorAll('body *')) {
     const style = getComputedStyle(element);
-    if (style.overflowX !== 'visible' && element.scrollWidth > element.clientWidth)
+    if (style.overflowX !== 'visible' && element.scrollWidth > element.clientWidth ||
+        style.overflowY !== 'visible' && element.scrollHeight > element.clientHeight)
       faults.push(`cut: ${element.textContent.slice(0, 60)}`);
     for (const attribute of element.attributes)
       if (attribute.name.startsWith('on')) faults.push(`handler ${attribute.name}`);

@@ -1,0 +1,160 @@
+// What the page's writers give, to the letter.
+#include <cmath>
+#include <gtest/gtest.h>
+#include <limits>
+
+#include "page/charts.h"
+#include "page/document.h"
+#include "page/number_text.h"
+#include "page/table.h"
+
+namespace tavrel::page {
+namespace {
+
+constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
+
+// The values of an attribute, one a line.
+std::string attributes(const HtmlWriter& html, const std::string& name) {
+  std::string found;
+  const std::string begin = " " + name + "=\"";
+  const std::string text(html.written());
+  for (std::size_t at = text.find(begin); at != std::string::npos; at = text.find(begin, at)) {
+    at += begin.size();
+    found += text.substr(at, text.find('"', at) - at) + "\n";
+  }
+  return found;
+}
+
+TEST(HtmlWriterTest, KeepsTextsText) {
+  HtmlWriter html;
+  html.begin("p", {{"title", "\"><script>'&"}, {"class", ""}});
+  html.text("<b>&amp;\n\t\x01\x7f\xff\u0085\uFFFE");
+  html.name("a.b..<c");
+  html.empty("br");
+  html.end();
+  EXPECT_EQ(html.written(),
+            "<p title=\"&quot;&gt;&lt;script&gt;'&amp;\">&lt;b&gt;&amp;amp;\n\t␁␡\uFFFD\uFFFD\uFFFD"
+            "<bdi>a.<wbr>b.<wbr>.<wbr>&lt;c</bdi><br/></p>");
+}
+
+TEST(DocumentTest, ListsItsSections) {
+  Document document("A <page>");
+  document.section("One & two").text("x");
+  document.section("Three");
+  const std::string text = document.text();
+  for (const char* part :
+       {"<title>A &lt;page&gt;</title>", "<h1><bdi>A &lt;page&gt;</bdi></h1>",
+        "<li><a href=\"#s1\">One &amp; two</a></li><li><a href=\"#s2\">Three</a></li>",
+        "<section aria-labelledby=\"s1\"><h2 id=\"s1\">One &amp; two</h2>x</section>"})
+    EXPECT_NE(text.find(part), std::string::npos) << part;
+}
+
+TEST(TableTest, MarksNamesAndNumbers) {
+  HtmlWriter html;
+  Table table(html, "T", {{"Key", Table::Align::Name}, {"n", Table::Align::Number}, {"Unit"}});
+  for (const char* key : {"a", "b"}) {
+    table.row();
+    table.cell(key);
+    table.cell("1");
+    table.cell("");
+  }
+  table.end();
+  const std::string row =
+      "<td class=\"number\" data-title=\"n\">1</td><td data-title=\"Unit\"></td>";
+  EXPECT_EQ(html.written(),
+            "<table aria-label=\"T\"><thead><tr><th scope=\"col\">Key</th><th scope=\"col\" "
+            "class=\"number\">n</th><th scope=\"col\">Unit</th></tr></thead><tbody><tr><th "
+            "scope=\"row\">a</th>" +
+                row + "</tr><tr><th scope=\"row\">b</th>" + row + "</tr></tbody></table>");
+}
+
+TEST(NumberTest, IsShortAndHasItsUnit) {
+  const std::pair<double, const char*> kNumbers[] = {{0, "0"},
+                                                     {-0.0, "−0"},
+                                                     {9999, "9999"},
+                                                     {12345, "12\u202F345"},
+                                                     {-1234567, "−1\u202F234\u202F567"},
+                                                     {1.23456, "1.235"},
+                                                     {99999.5, "100\u202F000"},
+                                                     {0.000123456, "0.0001235"},
+                                                     {1e300, "1e+300"},
+                                                     {kNan, "nan"}};
+  for (const auto& [value, text] : kNumbers)
+    EXPECT_EQ(shortNumber(value), text);
+  EXPECT_EQ(shortNumber(std::numeric_limits<std::int64_t>::min()),
+            "−9\u202F223\u202F372\u202F036\u202F854\u202F775\u202F808");
+  const std::tuple<double, const char*, const char*> kFigures[] = {
+      {5, "count", "5"},
+      {12.5, "percent", "12.5\u00A0%"},
+      {2048, "MiB", "2.0 GiB"},
+      {1, "bytes", "1 byte"},
+      {12.5, "milliseconds", "12.5 ms"},
+      {7199, "seconds", "120 min"},
+      {36, "hours", "36 h"},
+      {60, "hours", "2.5 days"},
+      {41250, "thousandths of a degree Celsius", "41.3 °C"},
+      {3, "pages", "3 pages"}};
+  for (const auto& [value, unit, text] : kFigures)
+    EXPECT_EQ(figureText(value, unit), text);
+}
+
+TEST(LineChartTest, HasGapsDotsAndABand) {
+  LineChart chart{"K", {0, 10, {}, 5, kNan, 10, 7.5, 5}, {}, {}, "first", "last", [](double value) {
+                    return shortNumber(value);
+                  }};
+  HtmlWriter line;
+  writeLineChart(line, chart);
+  EXPECT_EQ(attributes(line, "d"), "M0 100l1 -100M3 50h0M5 0l1 25 1 25\n");
+  EXPECT_EQ(attributes(line, "viewBox"), "0 0 7 100\n");
+  EXPECT_EQ(attributes(line, "aria-label"),
+            "K: first to last, 6 of 8 days told, lowest 0, highest 10, last 5\n");
+  chart.values = {5, 5, {}, 5};
+  chart.lows = {0, 2.5, {}, 0};
+  chart.highs = {10, 7.5, {}, 10};
+  HtmlWriter band;
+  writeLineChart(band, chart);
+  EXPECT_EQ(attributes(band, "d"), "M0 100l1 -25V25l-1 -25Z\nM0 50l1 0M3 50h0\n");
+  chart = {"K", {{}, {}}, {}, {}, "a", "b", chart.text};
+  HtmlWriter nothing;
+  writeLineChart(nothing, chart);
+  EXPECT_EQ(attributes(nothing, "aria-label") + attributes(nothing, "d"), "K: nothing told\n");
+  chart.values = {-1.7e308, 1.7e308, 0};
+  HtmlWriter wide;
+  writeLineChart(wide, chart);
+  EXPECT_EQ(attributes(wide, "d"), "M0 100l1 -100 1 50\n");
+}
+
+TEST(BarChartsTest, ShowWhatIsNotNothing) {
+  HtmlWriter histogram;
+  writeHistogram(histogram, {"H", {{"(0, 1]", 1}, {"(1, 2]", 0}, {"(2, 3]", 1e6}}, "0", "3"});
+  EXPECT_EQ(attributes(histogram, "x") + attributes(histogram, "height"), "0\n40\n4\n1000\n");
+  EXPECT_EQ(attributes(histogram, "aria-label"),
+            "H: 1\u202F000\u202F001 values, most in (2, 3]: 1\u202F000\u202F000\n");
+  HtmlWriter bars;
+  const Bar kBars[] = {{"a", 5, "5"}, {"b", -1, "-1"}, {"c", kNan, "?"}};
+  writeBars(bars, "B", kBars);
+  EXPECT_EQ(attributes(bars, "width"), "1000\n0\n0\n");
+  HtmlWriter shares;
+  const Share kShares[] = {{"on", 0.25, "1 s"}, {"no", kNan, ""}, {"off", 0.75, ""}, {"x", 9, ""}};
+  writeShares(shares, "S", kShares);
+  EXPECT_EQ(attributes(shares, "x") + attributes(shares, "width"), "0\n250\n250\n750\n");
+  EXPECT_EQ(attributes(shares, "style"),
+            "opacity:1.00\nopacity:0.75\nopacity:0.50\nopacity:0.25\n");
+}
+
+TEST(IntervalChartTest, HasOneScale) {
+  HtmlWriter html;
+  writeIntervals(
+      html,
+      {"I",
+       {{"a", -5, 0, 5, "0", false}, {"b", 5, 10, 15, "10", true}, {"c", kNan, 0, 0, "?", false}},
+       0,
+       [](double value) { return shortNumber(value); }});
+  EXPECT_EQ(attributes(html, "d"),
+            "M250 0V20\nM0 10H500\nM250 10h0\nM250 0V20\nM500 10H1000\nM750 10h0\nM250 0V20\n");
+  EXPECT_EQ(attributes(html, "style"), "left:25.0%\n");
+  EXPECT_NE(html.written().find("<li class=\"notable\"><span><bdi>b"), std::string_view::npos);
+}
+
+}  // namespace
+}  // namespace tavrel::page
