@@ -148,9 +148,10 @@ void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
 void writeNotes(PageScene& scene) {
   page::HtmlWriter& html = scene.document.section("About this page");
   html.element("p",
-               "The figures of this page are exact, also those that leave the device only in a "
-               "coarser form, or not at all: give it only to whom you would give the device. Days "
-               "are those of UTC. Nothing in the page comes from a network, and it sends nothing.");
+               "The figures of this page are exact, also those that leave the device in a coarser "
+               "form or not at all: give it to nobody who may not know them. What a log has is "
+               "worked out with the whitelist as it is now. Days are those of UTC. The page loads "
+               "nothing from a network and sends nothing.");
   if (!scene.recorded.fault.empty()) {
     html.begin("p", {{"class", "bad"}});
     html.name("Something is missing: " + scene.recorded.fault);

@@ -43,31 +43,42 @@ std::optional<double> daysLeft(double percentUsed, double inDays, double percent
   return std::max(100 - percentNow, 0.0) * inDays / percentUsed;
 }
 
-// Of the figure that the daily run stored, over the days of the page.
-std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear) {
+// Of the figure that the daily run stored, when it grew by so many percent over the days of the
+// page.
+std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear,
+                                      std::int64_t leastGrowth) {
   const auto known = scene.recorded.scalars.find(
       format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
   if (known == scene.recorded.scalars.end() || known->second.days.size() < 2) return std::nullopt;
   const auto& [firstDay, first] = *known->second.days.begin();
   const auto& [lastDay, last] = *known->second.days.rbegin();
-  return daysLeft(static_cast<double>(last) - static_cast<double>(first),
-                  static_cast<double>(lastDay) - firstDay, static_cast<double>(wear.percent));
+  const double growth = static_cast<double>(last) - static_cast<double>(first);
+  if (growth < static_cast<double>(leastGrowth)) return std::nullopt;
+  return daysLeft(growth, static_cast<double>(lastDay) - firstDay,
+                  static_cast<double>(wear.percent));
 }
 
 std::string yearsText(double days) {
   constexpr double kYear = 365.25;
   if (days < 2 * kYear) return format("%s days", page::shortNumber(std::round(days)));
-  return days < 100 * kYear ? format("%s years", page::shortNumber(std::round(days / kYear)))
-                            : std::string("more than 100 years");
+  if (days >= 100 * kYear) return "more than 100 years";
+  const double years = days / kYear;
+  return format("%.*f years", years < 10 ? 1 : 0, years);
 }
 
 std::string lifetimeText(const PageScene& scene, const Disk& disk) {
   const auto wear = wearOf(disk);
   if (!wear) return "Not known: the drive tells no wear";
   if (wear->percent >= 100) return "Its rated life is used up";
-  // The pace of late says more than that of the whole life, and needs no hours.
-  if (const auto days = daysLeftByTrend(scene, disk, *wear))
+  const auto byTrend = [&](std::int64_t leastGrowth) -> std::optional<std::string> {
+    const auto days = daysLeftByTrend(scene, disk, *wear, leastGrowth);
+    if (!days) return std::nullopt;
     return format("About %s at the pace of the days on this page", yearsText(*days));
+  };
+  // The pace of late says more than that of the whole life, unless it is only a step of a whole
+  // percent or two.
+  constexpr std::int64_t kClearGrowth = 3;
+  if (const auto text = byTrend(kClearGrowth)) return *text;
   constexpr double kHoursPerDay = 24;
   if (const auto hours = figureOf(disk, "power_on_hours"); hours && wear->figure == "used_pct") {
     const double days = static_cast<double>(*hours) / kHoursPerDay;
@@ -75,6 +86,7 @@ std::string lifetimeText(const PageScene& scene, const Disk& disk) {
     if (const auto left = daysLeft(percent, days, percent))
       return format("About %s of operation at the pace of its life so far", yearsText(*left));
   }
+  if (const auto text = byTrend(1)) return *text;
   return wear->percent == 0 ? "Not known yet: no wear so far"
                             : "Not known yet: its wear has not changed on these days";
 }

@@ -13,10 +13,6 @@ namespace {
 // Of one distribution, in memory.
 constexpr std::size_t kSortedValues = 1U << 20;
 
-std::int32_t daysBefore(std::int32_t day, std::int32_t days) {
-  return lowInt32(std::max(std::int64_t{day} - days, std::int64_t{kFirstDay}));
-}
-
 DayValues summedUp(std::vector<double>& values, const Summary& summary) {
   DayValues day;
   if (values.size() > kSortedValues || !summary.hasFinite()) return day;
@@ -31,8 +27,8 @@ DayValues summedUp(std::vector<double>& values, const Summary& summary) {
   return day;
 }
 
-// The last day that the range has; without any the day at its end.
-std::int32_t latestDay(const RecordedDays& recorded) {
+// The last day with statistics; nothing without any.
+std::optional<std::int32_t> latestDay(const RecordedDays& recorded) {
   std::optional<std::int32_t> latest;
   const auto look = [&](const auto& statistics) {
     for (const auto& [key, statistic] : statistics)
@@ -40,28 +36,20 @@ std::int32_t latestDay(const RecordedDays& recorded) {
   };
   look(recorded.scalars);
   look(recorded.distributions);
-  return latest.value_or(recorded.last);
-}
-
-Expected<std::int32_t> lastDayOfRange(ToolContext& context, std::int32_t days) {
-  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  const std::int32_t yesterday = previousDay(today);
-  auto history = openRecorded(context, {.key = "", .hasValues = false});
-  const auto held = history ? history->daysHeld() : history.error();
-  if (!held) return held.error();
-  if (!*held) return yesterday;
-  // A day that has not come is of a clock that was wrong.
-  if ((*held)->first > yesterday) return std::min((*held)->last, today);
-  return (*held)->last <= daysBefore(yesterday, days) ? (*held)->last : yesterday;
+  return latest;
 }
 
 class Reader {
  public:
-  Reader(ToolContext& context, RecordedDays& recorded) : context_(context), recorded_(recorded) {}
+  explicit Reader(ToolContext& context, std::int32_t days) : context_(context), days_(days) {}
 
-  Status readAll() {
+  /// What the days up to `last` have.
+  Status readDays(std::int32_t last) {
+    recorded_.first = lowInt32(std::max(std::int64_t{last} - days_ + 1, std::int64_t{kFirstDay}));
+    recorded_.last = last;
+    recorded_.day = last;
     auto history =
-        openRecorded(context_, {.key = "", .firstDay = recorded_.first, .lastDay = recorded_.last});
+        openRecorded(context_, {.key = "", .firstDay = recorded_.first, .lastDay = last});
     if (!history) return history.error();
     const Status read =
         history->walkScalars([&](std::string_view key, std::int32_t day, std::int64_t value,
@@ -78,6 +66,22 @@ class Reader {
     });
   }
 
+  /// The same up to yesterday, or, when they have nothing, up to the last day that has.
+  Status readLatest() {
+    const std::int32_t today = context_.platform().statistics->BHDaysSince1970();
+    Status read = readDays(previousDay(today));
+    if (read && !latestDay(recorded_)) {
+      auto history = openRecorded(context_, {.key = "", .hasValues = false});
+      const auto held = history ? history->daysHeld() : history.error();
+      if (!held) return held.error();
+      // A day that has not come is of a clock that was wrong.
+      if (*held) read = readDays(std::min((*held)->last, today));
+    }
+    recorded_.day = latestDay(recorded_).value_or(recorded_.last);
+    return read;
+  }
+
+  /// The values of the day that is shown.
   Status readDay() {
     auto history =
         openRecorded(context_, {.key = "", .firstDay = recorded_.day, .lastDay = recorded_.day});
@@ -101,6 +105,11 @@ class Reader {
     });
   }
 
+  RecordedDays take(std::string fault) {
+    recorded_.fault = std::move(fault);
+    return std::move(recorded_);
+  }
+
  private:
   template <class Statistics>
   static typename Statistics::mapped_type& entryOf(Statistics& statistics, std::string_view key) {
@@ -109,30 +118,18 @@ class Reader {
   }
 
   ToolContext& context_;
-  RecordedDays& recorded_;
+  std::int32_t days_;
+  RecordedDays recorded_;
 };
 
 }  // namespace
 
 RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
                               std::int32_t days) {
-  RecordedDays recorded;
-  const auto last = day ? Expected<std::int32_t>(*day) : lastDayOfRange(context, days);
-  const std::int32_t today = context.platform().statistics->BHDaysSince1970();
-  recorded.last = last ? *last : previousDay(today);
-  recorded.first = daysBefore(recorded.last, days - 1);
-  recorded.day = recorded.last;
-  if (!last) {
-    recorded.fault = last.error().message;
-    return recorded;
-  }
-  Reader reader(context, recorded);
-  const Status read = reader.readAll();
-  if (!day) recorded.day = latestDay(recorded);
-  const Status readDay = reader.readDay();
-  if (!read) recorded.fault = read.error().message;
-  if (read && !readDay) recorded.fault = readDay.error().message;
-  return recorded;
+  Reader reader(context, days);
+  Status read = day ? reader.readDays(*day) : reader.readLatest();
+  if (const Status values = reader.readDay(); read && !values) read = values;
+  return reader.take(read ? std::string() : read.error().message);
 }
 
 }  // namespace tavrel

@@ -38,8 +38,8 @@ struct RecordedDays {
   std::string fault;  // why something may be missing; empty when nothing is
 };
 
-/// So many days up to `day`. Without it, up to yesterday, and the day is the last of them that has
-/// statistics; a device that only has earlier or later ones is shown as of its last day.
+/// So many days up to `day`. Without it, up to yesterday, or, when these have nothing, up to the last
+/// day that has; the day that is shown is then the last one with statistics.
 RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
                               std::int32_t days);
 

@@ -21,8 +21,6 @@ using page::shortNumber;
 constexpr SectionLimit kScalarLimit{1000, 400'000};
 constexpr SectionLimit kDistributionLimit{100, 400'000};
 
-constexpr const char* kStays = "Stays on the device";
-
 // What the log's column shows, whatever type the value has.
 std::string coarseText(const plist::Value& value) {
   const auto number = value.number();
@@ -60,10 +58,10 @@ void writeScalarRow(page::Table& table, const ScalarRow& row) {
   const std::string_view unit = unitOf(row.key);
   table.row();
   table.cell([&](page::HtmlWriter& cell) { writeKey(cell, row.key); });
-  table.cell(row.exact ? shortNumber(*row.exact) : "measured for the log");
+  table.cell(row.exact ? shortNumber(*row.exact) : "measured for it");
   table.cell([&](page::HtmlWriter& cell) {
     if (row.coarse.isNull()) {
-      cell.element("small", "stays here");
+      cell.element("small", "not in it");
     } else {
       cell.text(coarseText(row.coarse));
     }
@@ -81,15 +79,13 @@ void writeLogState(const PageScene& scene, page::HtmlWriter& html, std::uint64_t
                    std::uint64_t all, std::string_view what) {
   std::string text;
   if (!scene.log.reason.empty()) {
-    text = format("Nothing leaves the device: there is no log of this day, because %s.",
-                  scene.log.reason);
+    text = format("%s. None leaves the device, because there is no log of this day: %s.",
+                  counted(all, what), scene.log.reason);
   } else {
-    text = format("Of %s, %llu %s in the log of this day", counted(all, what), leaving,
-                  leaving == 1 ? "is" : "are");
+    text = format("%s, of which the log of this day has %llu. ", counted(all, what), leaving);
     text += scene.log.isCovered
-                ? ", in the coarser form that is shown. The owner allows it to leave the device."
-                : ", in the coarser form that is shown. It stays here: the owner has not allowed "
-                  "it to leave the device.";
+                ? "The owner lets that log leave the device."
+                : "That log stays here: the owner has not allowed it to leave the device.";
   }
   html.begin("p");
   html.name(text);
@@ -121,13 +117,13 @@ void writeDayHistogram(page::HtmlWriter& html, std::string_view key, const DayVa
 void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) {
   html.begin("p", {{"class", "note leaves"}});
   if (leaving == nullptr) {
-    html.text(kStays);
+    html.text("Not in the log");
     html.end();
     return;
   }
   html.text(leaving->buckets.empty()
-                ? "Leaves as count, lowest, highest, mean and deviation"
-                : "Leaves as count, lowest, highest, mean and deviation, and as these counts");
+                ? "In the log: count, range, mean and deviation"
+                : "In the log: count, range, mean and deviation, and how many values are in");
   html.end();
   std::vector<page::Bar> bars;
   for (const auto& bucket : leaving->buckets) {
@@ -192,7 +188,7 @@ void writeScalars(PageScene& scene) {
   page::Table table(html, "Scalars",
                     {{"Statistic", page::Table::Align::Name},
                      {"Exact", kNumber},
-                     {"Leaves as", kNumber},
+                     {"In the log", kNumber},
                      {"Unit"}});
   std::size_t written = 0;
   for (; written < rows.size() && !kScalarLimit.isReached(written, html); ++written)

@@ -1,0 +1,139 @@
+// tavrelctl page
+#include <chrono>
+#include <regex>
+
+#include "base/civil_time.h"
+#include "device.h"
+#include "tools/shared/day_argument.h"
+
+namespace tavrel {
+namespace {
+
+std::int32_t today() {
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  return static_cast<std::int32_t>(std::chrono::duration_cast<std::chrono::seconds>(now).count() /
+                                   kSecondsPerDay);
+}
+
+struct PageTest : testing::Test {
+  const TemporaryDevice device;
+
+  void import(const std::string& lines) const {
+    ASSERT_EQ(device.run("stat import -", lines).status, 0);
+  }
+
+  /// The page without its style sheet, and with a blank for each tag.
+  std::string textOf(const std::string& options = {}, int status = 0) const {
+    const Outcome outcome = device.run("page -o - " + options);
+    EXPECT_EQ(outcome.status, status) << outcome.error;
+    const std::string body = outcome.out.substr(outcome.out.find("</head>") + 7);
+    return std::regex_replace(std::regex_replace(body, std::regex("<wbr>"), ""),
+                              std::regex("(<[^>]*>|\\s)+"), " ");
+  }
+
+  void expect(const std::string& text, std::initializer_list<std::string> parts) const {
+    for (const std::string& part : parts)
+      EXPECT_NE(text.find(part), text.npos) << part << "\n" << text.substr(0, 4000);
+  }
+
+  void writeDrive(const std::string& name, const std::string& kind,
+                  const std::string& figures) const {
+    device.write(
+        "/run/tavrel/health/" + name + ".plist",
+        xmlOf(R"({"version": 1, "name": ")" + name + R"(", "kind": ")" + kind +
+              R"(", "time": {"$date": "2026-01-01T00:00:00Z"}, "growth": {}, "figures": {)" +
+              figures + "}}"));
+  }
+};
+
+TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
+  const std::string yesterday = dayDateText(today() - 1);
+  expect(textOf(), {"Device on " + yesterday, "Logs may leave the device Not allowed",
+                    "Logs that wait All empty", "recorded no scalar on " + yesterday,
+                    "recorded nothing on these days", "No driver of this device tells",
+                    "No drive of this device tells"});
+  EXPECT_EQ(device.files(), TemporaryDevice().files());
+}
+
+TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
+  // How long ago statistics are of, and the day that is then shown.
+  const std::pair<int, int> kDays[] = {{100, 100}, {0, 0}, {3, 3}, {1, 1}};
+  for (const auto& [recorded, shown] : kDays) {
+    import("scalar\t" + std::to_string(today() - recorded) + "\tk\t1\n");
+    expect(textOf(), {"Device on " + dayDateText(today() - shown), "k 1 not in it"});
+  }
+  expect(textOf("--day 20000 --days 400"), {"Device on 2024-10-04", "Trends over 400 days"});
+}
+
+TEST_F(PageTest, TellsWhatLeaves) {
+  import(
+      "scalar\tyesterday\tcom.example.s\t1234\nscalar\tyesterday\tcom.example.t\t5\n"
+      "value\tyesterday\tcom.example.d\t1\t3\nvalue\tyesterday\tcom.example.d\t2\tinf\n"
+      "value\tyesterday\tcom.example.d\t3\tnan\n");
+  expect(textOf(), {"2 scalars. None leaves the device, because there is no log of this day: "});
+  device.write(kWhitelistFile, xmlOf(R"({"Usage": {
+      "ScalarKeys": {"com.example.s": {"sig_fig": 1}},
+      "DistributionKeys": {"com.example.d": {"intervals": [2, 4]}}}})"));
+  expect(textOf(), {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
+                    "has not allowed it",
+                    "com.example.s 1234 1000 com.example.t 5 not in it",
+                    "Values 3 Range 3 to inf Median 3 Mean inf",
+                    "and how many values are in (2, 4] 1 (4, inf) 2"});
+  ASSERT_EQ(device.run("allow --from yesterday").status, 0);
+  expect(textOf(), {"The owner lets that log leave the device",
+                    "Logs may leave the device From " + dayDateText(today() - 1) + " on"});
+}
+
+TEST_F(PageTest, SaysWhatItLeavesOut) {
+  std::string lines;
+  for (int i = 0; i < 1300; ++i)
+    lines += "scalar\tyesterday\tcom.example." + std::string(60, '"') + std::to_string(i) + "\t1\n";
+  for (int i = 0; i < 150; ++i)
+    lines += "value\tyesterday\tcom.example.d" + std::to_string(i) + "\t1\t2\n";
+  import(lines);
+  const std::string size = device.run("page --days 400 -o -").out;
+  EXPECT_LT(size.size(), 2'000'000U);
+  const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
+  const std::string text = textOf("--days 400");
+  expect(text, {"There is no room here for 50 distributions more: " + day + " has them all",
+                "1330 statistics more without a chart"});
+  const std::regex left("no room here for (\\d+) (scalars|statistics) more");
+  EXPECT_EQ(
+      std::distance(std::sregex_iterator(text.begin(), text.end(), left), std::sregex_iterator()),
+      2);
+}
+
+TEST_F(PageTest, EstimatesHowLongDrivesLast) {
+  import("scalar\t" + std::to_string(today() - 11) +
+         "\tcom.norvane.ioreport.nvme3.used_pct\t40\n"
+         "scalar\tyesterday\tcom.norvane.ioreport.nvme3.used_pct\t50\n");
+  writeDrive("nvme0", "nvme", R"("used_pct": 10, "power_on_hours": 2400)");
+  writeDrive("nvme1", "nvme", R"("used_pct": 100)");
+  writeDrive("nvme2", "nvme", R"("used_pct": 0, "power_on_hours": 9)");
+  writeDrive("nvme3", "nvme", R"("used_pct": 50, "power_on_hours": 9)");
+  writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
+  writeDrive("sda", "ata", R"("smart_good": 0)");
+  expect(textOf(), {"About 2.5 years of operation at the pace of its life so far",
+                    "Its rated life is used up", "Not known yet: no wear so far",
+                    "About 50 days at the pace of the days on this page",
+                    "Not known yet: its wear has not changed on these days",
+                    "Not known: the drive tells no wear", "failing, SMART status is failing"});
+}
+
+TEST_F(PageTest, RefusesWhatItCannotDo) {
+  device.check("page", fails("--output is required: see 'tavrelctl page --help'", 2));
+  for (const char* days : {"0", "401", "x"}) {
+    const Outcome outcome = device.run("page -o - --days " + std::string(days));
+    EXPECT_EQ(outcome.status, 2) << outcome;
+  }
+  EXPECT_EQ(device.run("page -o - --day tomorrow").status, 2);
+  const std::string nowhere = device.path("/nowhere/x.html");
+  const Outcome outcome = device.run("page -o " + nowhere);
+  EXPECT_EQ(outcome.status, 1);
+  expect(outcome.error, {"cannot write " + nowhere});
+  device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb", "no database");
+  expect(textOf("", 1), {"Something is missing: ", "Critical"});
+}
+
+}  // namespace
+}  // namespace tavrel
