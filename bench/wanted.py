@@ -31,6 +31,8 @@ LIMITS = {
     "long history: tavrel -f, ratio to one day": 2.0,
     "long history: status, ms": 100.0,
     "long history: log list, ms": 100.0,
+    "page of 365 days, ms": 1000.0,
+    "page of 365 days, MB": 2.0,
 }
 
 

@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-constexpr SectionLimit kChannelLimit{150, 250'000};
+constexpr SectionLimit kChannelLimit{150, 200'000};
 // Of one channel; the others are summed up.
 constexpr std::size_t kStates = 24;
 

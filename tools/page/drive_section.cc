@@ -16,7 +16,7 @@ namespace {
 
 using namespace health;
 
-constexpr SectionLimit kDriveLimit{32, 200'000};
+constexpr SectionLimit kDriveLimit{32, 150'000};
 
 std::optional<std::int64_t> figureOf(const Disk& disk, std::string_view name) {
   const std::int64_t* const value = valueOf(disk.reading.figures, name);

@@ -18,8 +18,8 @@ namespace {
 using page::figureText;
 using page::shortNumber;
 
-constexpr SectionLimit kScalarLimit{1000, 400'000};
-constexpr SectionLimit kDistributionLimit{100, 400'000};
+constexpr SectionLimit kScalarLimit{1000, 350'000};
+constexpr SectionLimit kDistributionLimit{100, 350'000};
 
 // What the log's column shows, whatever type the value has.
 std::string coarseText(const plist::Value& value) {

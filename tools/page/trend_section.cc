@@ -15,9 +15,9 @@ namespace {
 
 using Values = std::vector<std::optional<double>>;
 
-constexpr SectionLimit kChartLimit{120, 700'000};
+constexpr SectionLimit kChartLimit{120, 600'000};
 // Of those beyond, in a table.
-constexpr SectionLimit kRowLimit{500, 900'000};
+constexpr SectionLimit kRowLimit{500, 800'000};
 
 /// A statistic over the days of the page.
 struct Trend {
