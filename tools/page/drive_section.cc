@@ -50,8 +50,8 @@ std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, 
   const auto known = scene.recorded.scalars.find(
       format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
   if (known == scene.recorded.scalars.end() || known->second.days.size() < 2) return std::nullopt;
-  const auto& [firstDay, first] = *known->second.days.begin();
-  const auto& [lastDay, last] = *known->second.days.rbegin();
+  const auto& [firstDay, first] = known->second.days.front();
+  const auto& [lastDay, last] = known->second.days.back();
   const double growth = static_cast<double>(last) - static_cast<double>(first);
   if (growth < static_cast<double>(leastGrowth)) return std::nullopt;
   return daysLeft(growth, static_cast<double>(lastDay) - firstDay,

@@ -89,7 +89,7 @@ void addPageCommand(Command app, ToolContext& context) {
                  "File to write, in one step; - is standard output")
       .typeName("FILE")
       .required();
-  command.addOption("--days", arguments->days, "How many days trends show, at most 400")
+  command.addOption("--days", arguments->days, "Days of the trends, at most 400")
       .typeName("N")
       .showDefault()
       .check(faultOfDays);

@@ -32,7 +32,7 @@ std::optional<std::int32_t> latestDay(const RecordedDays& recorded) {
   std::optional<std::int32_t> latest;
   const auto look = [&](const auto& statistics) {
     for (const auto& [key, statistic] : statistics)
-      latest = std::max(latest.value_or(kFirstDay), statistic.days.rbegin()->first);
+      latest = std::max(latest.value_or(kFirstDay), statistic.days.back().first);
   };
   look(recorded.scalars);
   look(recorded.distributions);
@@ -51,9 +51,10 @@ class Reader {
     auto history =
         openRecorded(context_, {.key = "", .firstDay = recorded_.first, .lastDay = last});
     if (!history) return history.error();
-    const Status read =
-        history->walkScalars([&](std::string_view key, std::int32_t day, std::int64_t value,
-                                 bool&) { entryOf(recorded_.scalars, key).days[day] = value; });
+    const Status read = history->walkScalars(
+        [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+          entryOf(recorded_.scalars, key).days.emplace_back(day, value);
+        });
     if (!read) return read;
     return history->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
                                           BHHistoryDistributionEnumerator& enumerator, bool&) {
@@ -62,7 +63,8 @@ class Reader {
       std::uint32_t seconds = 0;
       while (enumerator.getNextValue(value, seconds))
         summary.add(value);
-      if (!enumerator.failed()) entryOf(recorded_.distributions, key).days[day] = summary;
+      if (!enumerator.failed())
+        entryOf(recorded_.distributions, key).days.emplace_back(day, summary);
     });
   }
 
@@ -100,7 +102,9 @@ class Reader {
       if (enumerator.failed()) return;
       RecordedDistribution& distribution = entryOf(recorded_.distributions, key);
       // What was recorded since the first look counts as well.
-      distribution.days[recorded_.day] = summary;
+      auto& byDay = distribution.days;
+      if (!byDay.empty() && byDay.back().first == recorded_.day) byDay.pop_back();
+      byDay.emplace_back(recorded_.day, summary);
       distribution.values = summedUp(values, summary);
     });
   }

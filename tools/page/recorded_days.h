@@ -2,10 +2,10 @@
 #pragma once
 
 #include <cstdint>
-#include <functional>
 #include <map>
 #include <optional>
 #include <string>
+#include <utility>
 #include <vector>
 
 #include "tools/shared/distribution_view.h"
@@ -20,12 +20,15 @@ struct DayValues {
   std::vector<DistributionView::Bucket> buckets;
 };
 
-/// Days are ascending.
+/// Values by day, ascending.
+template <class Value>
+using ByDay = std::vector<std::pair<std::int32_t, Value>>;
+
 struct RecordedScalar {
-  std::map<std::int32_t, std::int64_t> days;
+  ByDay<std::int64_t> days;
 };
 struct RecordedDistribution {
-  std::map<std::int32_t, Summary> days;
+  ByDay<Summary> days;
   DayValues values;
 };
 
@@ -36,10 +39,16 @@ struct RecordedDays {
   std::map<std::string, RecordedScalar, std::less<>> scalars;
   std::map<std::string, RecordedDistribution, std::less<>> distributions;
   std::string fault;  // why something may be missing; empty when nothing is
+
+  /// Of the day that is shown, which no statistic goes beyond; null without a value.
+  template <class Value>
+  const Value* ofDay(const ByDay<Value>& days) const {
+    return !days.empty() && days.back().first == day ? &days.back().second : nullptr;
+  }
 };
 
-/// So many days up to `day`. Without it, up to yesterday, or, when these have nothing, up to the last
-/// day that has; the day that is shown is then the last one with statistics.
+/// So many days up to `day`. Without it, up to yesterday, or, when these have nothing, up to the
+/// last day that has; the day that is shown is then the last one with statistics.
 RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
                               std::int32_t days);
 

@@ -39,8 +39,7 @@ struct ScalarRow {
 std::vector<ScalarRow> scalarRows(const PageScene& scene) {
   std::map<std::string_view, ScalarRow> rows;
   for (const auto& [key, scalar] : scene.recorded.scalars) {
-    const auto day = scalar.days.find(scene.recorded.day);
-    if (day != scalar.days.end()) rows[key] = {key, day->second, {}};
+    if (const auto* const value = scene.recorded.ofDay(scalar.days)) rows[key] = {key, *value, {}};
   }
   for (const plist::Entry& entry : scene.log.scalars) {
     ScalarRow& row = rows[entry.key.view()];
@@ -213,8 +212,8 @@ void writeDistributions(PageScene& scene) {
        keysLeavingFirst(scene.recorded.distributions,
                         [&](std::string_view name) { return leaving.contains(name); })) {
     const RecordedDistribution& recorded = scene.recorded.distributions.find(key)->second;
-    const auto day = recorded.days.find(scene.recorded.day);
-    if (day != recorded.days.end()) rows.push_back({key, &day->second, &recorded.values});
+    if (const Summary* const summary = scene.recorded.ofDay(recorded.days))
+      rows.push_back({key, summary, &recorded.values});
   }
   if (rows.empty()) return writeNoDay(scene, html, "distribution");
   const auto leaves =

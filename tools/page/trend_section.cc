@@ -1,6 +1,7 @@
 // Statistics over days.
 #include <algorithm>
 #include <cmath>
+#include <set>
 
 #include "base/format.h"
 #include "page/charts.h"
@@ -19,72 +20,84 @@ constexpr SectionLimit kChartLimit{120, 600'000};
 // Of those beyond, in a table.
 constexpr SectionLimit kRowLimit{500, 800'000};
 
-/// A statistic over the days of the page.
+/// A statistic over the days of the page: a scalar or a distribution.
 struct Trend {
   std::string_view key;
-  Values values;  // of a distribution its means
-  Values lows, highs;
-  bool leaves = false;
+  const RecordedScalar* scalar = nullptr;
+  const RecordedDistribution* distribution = nullptr;
 };
 
-std::optional<double> finite(double value) {
-  return std::isfinite(value) ? std::optional(value) : std::nullopt;
+// Those in the log first.
+std::vector<Trend> trendsOf(const PageScene& scene) {
+  std::set<std::string_view> inLog;
+  for (const DistributionView& view : scene.log.distributions)
+    inLog.insert(view.key);
+  std::vector<Trend> trends;
+  for (const auto& [key, scalar] : scene.recorded.scalars)
+    trends.push_back({key, &scalar, nullptr});
+  for (const auto& [key, distribution] : scene.recorded.distributions)
+    trends.push_back({key, nullptr, &distribution});
+  std::ranges::stable_sort(trends, {}, [&](const Trend& trend) {
+    const bool leaves = trend.scalar != nullptr ? !scene.log.scalars.get(trend.key).isNull()
+                                                : inLog.contains(trend.key);
+    return std::pair(!leaves, trend.key);
+  });
+  return trends;
 }
 
-class Trends {
- public:
-  explicit Trends(const PageScene& scene) : recorded_(scene.recorded) {
-    const std::size_t days =
-        static_cast<std::size_t>(std::int64_t{recorded_.last} - recorded_.first + 1);
-    for (const auto& [key, scalar] : recorded_.scalars) {
-      Trend trend{key, Values(days), {}, {}, !scene.log.scalars.get(key).isNull()};
-      for (const auto& [day, value] : scalar.days)
-        trend.values[place(day)] = static_cast<double>(value);
-      trends_.push_back(std::move(trend));
-    }
-    for (const auto& [key, distribution] : recorded_.distributions) {
-      Trend trend{key, Values(days), Values(days), Values(days), false};
-      for (const auto& [day, summary] : distribution.days) {
-        if (summary.numbers() == 0) continue;
-        trend.values[place(day)] = finite(summary.mean());
-        trend.lows[place(day)] = finite(summary.minimum());
-        trend.highs[place(day)] = finite(summary.maximum());
-      }
-      trend.leaves = std::ranges::find(scene.log.distributions, key, &DistributionView::key) !=
-                     scene.log.distributions.end();
-      trends_.push_back(std::move(trend));
-    }
-    std::ranges::stable_sort(
-        trends_, {}, [](const Trend& trend) { return std::pair(!trend.leaves, trend.key); });
+template <class Value, class Figure>
+Values overDays(const RecordedDays& recorded, const ByDay<Value>& days, const Figure& figure) {
+  Values values(static_cast<std::size_t>(std::int64_t{recorded.last} - recorded.first + 1));
+  for (const auto& [day, value] : days) {
+    const double number = figure(value);
+    if (std::isfinite(number))
+      values[static_cast<std::size_t>(std::int64_t{day} - recorded.first)] = number;
   }
+  return values;
+}
 
-  const std::vector<Trend>& all() const { return trends_; }
+// A mean, minimum or maximum.
+Values figureOverDays(const RecordedDays& recorded, const ByDay<Summary>& days,
+                      double (Summary::*figure)() const) {
+  return overDays(recorded, days, [figure](const Summary& summary) {
+    return summary.numbers() > 0 ? (summary.*figure)() : std::nan("");
+  });
+}
 
- private:
-  std::size_t place(std::int32_t day) const {
-    return static_cast<std::size_t>(std::int64_t{day} - recorded_.first);
-  }
-
-  const RecordedDays& recorded_;
-  std::vector<Trend> trends_;
-};
+// Of a distribution its means.
+Values valuesOf(const RecordedDays& recorded, const Trend& trend) {
+  if (trend.distribution != nullptr)
+    return figureOverDays(recorded, trend.distribution->days, &Summary::mean);
+  return overDays(recorded, trend.scalar->days,
+                  [](std::int64_t value) { return static_cast<double>(value); });
+}
 
 void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& trend) {
   const std::string_view unit = unitOf(trend.key);
   beginCard(html, trend.key);
   writeKey(html, trend.key);
   html.end();
-  writeLineChart(html, {std::string(trend.key), trend.values, trend.lows, trend.highs,
-                        dayDateText(scene.recorded.first), dayDateText(scene.recorded.last),
-                        [unit](double value) { return page::figureText(value, unit); }});
+  const RecordedDays& recorded = scene.recorded;
+  page::LineChart chart{std::string(trend.key),
+                        valuesOf(recorded, trend),
+                        {},
+                        {},
+                        dayDateText(recorded.first),
+                        dayDateText(recorded.last),
+                        [unit](double value) { return page::figureText(value, unit); }};
+  if (trend.distribution != nullptr) {
+    chart.lows = figureOverDays(recorded, trend.distribution->days, &Summary::minimum);
+    chart.highs = figureOverDays(recorded, trend.distribution->days, &Summary::maximum);
+  }
+  writeLineChart(html, chart);
   html.end();
 }
 
-void writeRow(page::Table& table, const Trend& trend) {
+void writeRow(const RecordedDays& recorded, page::Table& table, const Trend& trend) {
   const std::string_view unit = unitOf(trend.key);
   std::size_t told = 0;
   double low = 0, high = 0, last = 0;
-  for (const auto& value : trend.values) {
+  for (const auto& value : valuesOf(recorded, trend)) {
     if (!value) continue;
     low = told == 0 ? *value : std::min(low, *value);
     high = told == 0 ? *value : std::max(high, *value);
@@ -104,19 +117,19 @@ void writeTrends(PageScene& scene) {
   const RecordedDays& recorded = scene.recorded;
   const auto days = static_cast<std::uint64_t>(std::int64_t{recorded.last} - recorded.first + 1);
   page::HtmlWriter& html = scene.document.section(format("Trends over %s", counted(days, "day")));
-  const Trends trends(scene);
-  if (trends.all().empty()) {
+  const std::vector<Trend> trends = trendsOf(scene);
+  if (trends.empty()) {
     html.element("p", "The device recorded nothing on these days.");
     return;
   }
   html.element("p",
                "Exact figures. A gap is a day on which the device told nothing. Of a distribution "
                "the line is the mean, and the area reaches from the lowest to the highest value.");
-  const std::size_t count = trends.all().size();
+  const std::size_t count = trends.size();
   std::size_t written = 0;
   html.begin("div", {{"class", "cards"}});
   for (; written < count && !kChartLimit.isReached(written, html); ++written)
-    writeChart(scene, html, trends.all()[written]);
+    writeChart(scene, html, trends[written]);
   html.end();
   if (written == count) return;
   html.element("h3", format("%s more without a chart", counted(count - written, "statistic")));
@@ -129,7 +142,7 @@ void writeTrends(PageScene& scene) {
                      {"Last", kNumber}});
   const std::size_t charts = written;
   for (; written < count && !kRowLimit.isReached(written - charts, html); ++written)
-    writeRow(table, trends.all()[written]);
+    writeRow(recorded, table, trends[written]);
   table.end();
   writeLeftOut(html, count - written, "statistic", "tavrelctl stat list");
 }
