@@ -1,14 +1,12 @@
 // The device itself: the head of the page, its health, and notes on the page.
 #include <algorithm>
-#include <nlohmann/json.hpp>
 
 #include "base/format.h"
 #include "base/version.h"
-#include "page/number_text.h"
 #include "page/table.h"
+#include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/platform.h"
-#include "tools/log/log_conclusion.h"
 #include "tools/page/sections.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
@@ -16,15 +14,7 @@
 namespace tavrel {
 namespace {
 
-void fact(page::HtmlWriter& html, std::string_view term, std::string_view text,
-          std::string_view style = {}) {
-  html.begin("div");
-  html.element("dt", term);
-  html.begin("dd", {{"class", style}});
-  html.name(text);
-  html.end();
-  html.end();
-}
+constexpr SectionLimit kCheckLimit{100, 50'000};
 
 std::string_view styleOf(CheckState state) {
   switch (state) {
@@ -104,10 +94,10 @@ void writeVerdict(page::HtmlWriter& html, const std::vector<Check>& checks) {
     if (counts[index] == 0) continue;
     appendFormat(text, "%s%llu %s", text.empty() ? "" : ", ", counts[index], kWords[index]);
   }
-  fact(html, "Checks",
-       text.empty() ? format("All %zu good", checks.size())
-                    : format("%s, of %zu", text, checks.size()),
-       styleOf(state));
+  writeFact(html, "Checks",
+            text.empty() ? format("All %zu good", checks.size())
+                         : format("%s, of %zu", text, checks.size()),
+            styleOf(state));
 }
 
 }  // namespace
@@ -117,24 +107,23 @@ void writeHead(PageScene& scene, const std::vector<Check>& checks) {
   const SubmissionPermission permission = submissionPermission(scene.context.preferences());
   html.begin("dl");
   writeVerdict(html, checks);
-  fact(html, "Logs may leave the device", permissionText(permission),
-       permission.isGiven ? "good" : "warn");
-  fact(html, "Logs that wait", queuesText(checks));
-  fact(html, "Day of the figures", dayText(scene.recorded.day));
-  fact(html, "System", scene.osVersion.empty() ? "Not known" : scene.osVersion);
-  fact(html, "tavrel", std::string(version()));
+  writeFact(html, "Logs may leave the device", permissionText(permission));
+  writeFact(html, "Logs that wait", queuesText(checks));
+  writeFact(html, "Day of the figures", dayText(scene.recorded.day));
+  writeFact(html, "System", scene.osVersion.empty() ? "Not known" : scene.osVersion);
+  writeFact(html, "tavrel", std::string(version()));
   html.end();
 }
 
 void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
   page::HtmlWriter& html = scene.document.section("Health");
-  const LogConclusion conclusion = concludeOnLogs(scene.context);
-  html.element("p", format("The %s run: %s.", conclusion.run(), conclusion.text()));
+  const std::vector<const Check*> sorted = gravestFirst(checks);
   constexpr auto kPlain = page::Table::Align::Plain;
   page::Table table(html, "Health",
                     {{"Check", page::Table::Align::Name}, {"State", kPlain}, {"Finding", kPlain}});
-  for (const Check* const found : gravestFirst(checks)) {
-    const Check& check = *found;
+  std::size_t written = 0;
+  for (; written < checks.size() && !kCheckLimit.isReached(written, html); ++written) {
+    const Check& check = *sorted[written];
     table.row();
     table.cell([&](page::HtmlWriter& cell) { cell.name(titleOf(check)); });
     table.cell([&](page::HtmlWriter& cell) {
@@ -143,6 +132,7 @@ void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
     table.cell([&](page::HtmlWriter& cell) { cell.name(check.text); });
   }
   table.end();
+  writeLeftOut(html, checks.size() - written, "check", "tavrelctl status --check");
 }
 
 void writeNotes(PageScene& scene) {
@@ -152,11 +142,24 @@ void writeNotes(PageScene& scene) {
                "form or not at all: give it to nobody who may not know them. What a log has is "
                "worked out with the whitelist as it is now. Days are those of UTC. The page loads "
                "nothing from a network and sends nothing.");
-  if (!scene.recorded.fault.empty()) {
+  const auto missing = [&html](std::string_view text) {
     html.begin("p", {{"class", "bad"}});
-    html.name("Something is missing: " + scene.recorded.fault);
+    html.name(text);
     html.end();
-  }
+  };
+  if (!scene.recorded.fault.empty()) missing("Something is missing: " + scene.recorded.fault);
+  for (const std::string& error : scene.log.errors)
+    missing("The log may lack something: " + error);
+}
+
+void writeFact(page::HtmlWriter& html, std::string_view term, std::string_view text,
+               std::string_view style) {
+  html.begin("div");
+  html.element("dt", term);
+  html.begin("dd", {{"class", style}});
+  html.name(text);
+  html.end();
+  html.end();
 }
 
 void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view what,

@@ -104,25 +104,20 @@ void writeDrive(const PageScene& scene, page::HtmlWriter& html, const Disk& disk
   html.name(reading.name);
   html.end();
   html.begin("dl");
-  const auto fact = [&html](std::string_view term, std::string_view text,
-                            std::string_view style = {}) {
-    html.begin("div");
-    html.element("dt", term);
-    html.begin("dd", {{"class", style}});
-    html.name(text);
-    html.end();
-    html.end();
-  };
   std::string verdict = disk.verdict.word();
   for (const std::string& reason : disk.verdict.reasons)
     verdict += ", " + reason;
   const bool isGrave = (disk.verdict.problems & kFailing) != 0;
-  fact("Verdict", verdict, disk.verdict.problems == 0 ? "good" : isGrave ? "bad" : "warn");
-  if (!reading.model.empty()) fact("Model", reading.model);
-  if (!reading.firmware.empty()) fact("Firmware", reading.firmware);
-  if (reading.capacity) fact("Capacity", sizeText(static_cast<double>(*reading.capacity)));
-  fact("Read", ageText(disk.age) + " ago");
-  fact("Life left", lifetimeText(scene, disk));
+  writeFact(html, "Verdict", verdict,
+            disk.verdict.problems == 0 ? "good"
+            : isGrave                  ? "bad"
+                                       : "warn");
+  if (!reading.model.empty()) writeFact(html, "Model", reading.model);
+  if (!reading.firmware.empty()) writeFact(html, "Firmware", reading.firmware);
+  if (reading.capacity)
+    writeFact(html, "Capacity", sizeText(static_cast<double>(*reading.capacity)));
+  writeFact(html, "Read", ageText(disk.age) + " ago");
+  writeFact(html, "Life left", lifetimeText(scene, disk));
   html.end();
   if (const auto wear = wearOf(disk)) {
     const double used = std::clamp(static_cast<double>(wear->percent) / 100, 0.0, 1.0);

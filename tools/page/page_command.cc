@@ -30,6 +30,7 @@ struct Arguments {
 
 PageLog pageLogOf(ToolContext& context, const LogPreview& preview, std::int32_t day) {
   PageLog log;
+  log.errors = preview.errors;
   log.isCovered = submissionPermission(context.preferences()).covers(day);
   if (!preview.log) {
     log.reason = preview.reason;
@@ -57,6 +58,8 @@ void makePage(ToolContext& context, const Arguments& arguments) {
       readRecordedDays(context, day, static_cast<std::int32_t>(arguments.days));
   if (!recorded.fault.empty()) context.fail(recorded.fault);
   const LogPreview preview = previewLog(context, recorded.day);
+  for (const std::string& error : preview.errors)
+    context.note(error);
   const PageLog log = pageLogOf(context, preview, recorded.day);
 
   page::Document document(format("Device on %s", dayDateText(recorded.day)));

@@ -21,7 +21,8 @@ struct PageLog {
   std::string reason;         // why there is none; empty when there is one
   plist::Dictionary scalars;  // an empty handle without a log
   std::vector<DistributionView> distributions;
-  bool isCovered = false;  // by the owner's permission
+  bool isCovered = false;           // by the owner's permission
+  std::vector<std::string> errors;  // met while it was made
 };
 
 /// What all sections share.
@@ -55,24 +56,17 @@ void writeNotes(PageScene& scene);
 
 // -- What several sections need ------------------------------------------------------------------
 
-/// Keys of a map, those that the log has before the others.
-template <class Statistics, class IsInLog>
-std::vector<std::string_view> keysLeavingFirst(const Statistics& statistics,
-                                               const IsInLog& isInLog) {
-  std::vector<std::string_view> keys;
-  for (const bool leaves : {true, false})
-    for (const auto& [key, statistic] : statistics)
-      if (isInLog(key) == leaves) keys.push_back(key);
-  return keys;
-}
-
 /// A key with its meaning below it, as it heads a row.
 void writeKey(page::HtmlWriter& html, std::string_view key);
 /// Begins a card with a heading, which the caller ends; a long key gets a wide one.
 void beginCard(page::HtmlWriter& html, std::string_view key);
 /// The unit that the catalogue has for a key; empty when it is not known.
 std::string_view unitOf(std::string_view key);
-/// "a sentence with the count of what was left out", as a note; nothing for 0.
+/// A fact in a list of them, from outside; `style` is "good", "warn", "bad" or empty.
+void writeFact(page::HtmlWriter& html, std::string_view term, std::string_view text,
+               std::string_view style = {});
+/// Says that so many of `what`, in the singular, are only in the output of the command `where`.
+/// Nothing for 0.
 void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view what,
                   std::string_view where);
 

@@ -47,9 +47,9 @@ std::vector<ScalarRow> scalarRows(const PageScene& scene) {
     row.coarse = entry.value;
   }
   std::vector<ScalarRow> list;
-  for (const bool leaves : {true, false})
+  for (const bool isInLog : {true, false})
     for (const auto& [key, row] : rows)
-      if (row.coarse.isNull() != leaves) list.push_back(row);
+      if (row.coarse.isNull() != isInLog) list.push_back(row);
   return list;
 }
 
@@ -57,7 +57,7 @@ void writeScalarRow(page::Table& table, const ScalarRow& row) {
   const std::string_view unit = unitOf(row.key);
   table.row();
   table.cell([&](page::HtmlWriter& cell) { writeKey(cell, row.key); });
-  table.cell(row.exact ? shortNumber(*row.exact) : "measured for it");
+  table.cell(row.exact ? shortNumber(*row.exact) : "not kept");
   table.cell([&](page::HtmlWriter& cell) {
     if (row.coarse.isNull()) {
       cell.element("small", "not in it");
@@ -208,17 +208,16 @@ void writeDistributions(PageScene& scene) {
     const DayValues* values;
   };
   std::vector<Row> rows;
-  for (const std::string_view key :
-       keysLeavingFirst(scene.recorded.distributions,
-                        [&](std::string_view name) { return leaving.contains(name); })) {
-    const RecordedDistribution& recorded = scene.recorded.distributions.find(key)->second;
+  for (const auto& [key, recorded] : scene.recorded.distributions) {
     if (const Summary* const summary = scene.recorded.ofDay(recorded.days))
       rows.push_back({key, summary, &recorded.values});
   }
   if (rows.empty()) return writeNoDay(scene, html, "distribution");
-  const auto leaves =
-      std::ranges::count_if(rows, [&](const Row& row) { return leaving.contains(row.key); });
-  writeLogState(scene, html, static_cast<std::uint64_t>(leaves), rows.size(), "distribution");
+  // Those in the log first.
+  const auto others = std::stable_partition(
+      rows.begin(), rows.end(), [&](const Row& row) { return leaving.contains(row.key); });
+  writeLogState(scene, html, static_cast<std::uint64_t>(others - rows.begin()), rows.size(),
+                "distribution");
   html.begin("div", {{"class", "cards"}});
   std::size_t written = 0;
   for (; written < rows.size() && !kDistributionLimit.isReached(written, html); ++written) {
