@@ -7,8 +7,6 @@ import shutil
 import subprocess
 import tempfile
 
-START_SECONDS = 120
-
 
 class Browser:
     """Opens one page. As a context manager it ends the browser."""
@@ -45,12 +43,16 @@ class Browser:
         self.process.wait()
         shutil.rmtree(self.profile, ignore_errors=True)
 
+    def fail(self):
+        self.__exit__()
+        raise SystemExit("page test: chromium ended: does 'chromium --headless' run here?")
+
     def receive(self):
         message = bytearray()
         while not message.endswith(b"\0"):
             byte = self.reader.read(1) if not self.reader.peek(1) else self.take()
             if not byte:
-                raise SystemExit("page test: chromium ended: does 'chromium --headless' run here?")
+                self.fail()
             message += byte
         return json.loads(message[:-1])
 
@@ -65,7 +67,10 @@ class Browser:
         command = {"id": self.number, "method": method, "params": parameters}
         if self.session:
             command["sessionId"] = self.session
-        os.write(self.commands, json.dumps(command).encode() + b"\0")
+        try:
+            os.write(self.commands, json.dumps(command).encode() + b"\0")
+        except BrokenPipeError:
+            self.fail()
         while True:
             reply = self.receive()
             if reply.get("id") == self.number:
