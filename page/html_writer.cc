@@ -11,15 +11,19 @@ bool isPlain(char character) {
          character != '&' && character != '"';
 }
 
-// Noncharacters, and controls other than line ends and tabs, must not stand in a document.
-char32_t allowed(char32_t point) {
+// Noncharacters, and controls other than line ends and tabs, must not stand in a document. What
+// turns the direction of text could make one name look like another.
+char32_t shown(char32_t point) {
   constexpr char32_t kControlPictures = 0x2400;
   constexpr char32_t kDeletePicture = 0x2421;
   if (point == '\n' || point == '\t') return point;
   if (point < ' ') return kControlPictures + point;
   if (point == 0x7F) return kDeletePicture;
+  const bool isControl = point > 0x7F && point < 0xA0;
   const bool isNoncharacter = (point & 0xFFFE) == 0xFFFE || (point >= 0xFDD0 && point <= 0xFDEF);
-  return isNoncharacter || (point > 0x7F && point < 0xA0) ? kReplacementCharacter : point;
+  const bool turnsDirection =
+      (point >= 0x202A && point <= 0x202E) || (point >= 0x2066 && point <= 0x2069);
+  return isControl || isNoncharacter || turnsDirection ? kReplacementCharacter : point;
 }
 
 void appendEscaped(std::string& out, std::string_view text) {
@@ -44,7 +48,7 @@ void appendEscaped(std::string& out, std::string_view text) {
         out += "&quot;";
         break;
       default:
-        appendCodePoint(out, allowed(point));
+        appendCodePoint(out, shown(point));
     }
   }
 }

@@ -7,8 +7,8 @@
 //   html.element("td", anything);
 //
 // Names of elements and attributes are literals of the program and written as they are; texts and
-// values of attributes are escaped. Malformed UTF-8 is repaired, and characters that HTML does not
-// allow become visible ones.
+// values of attributes are escaped. Malformed UTF-8 is repaired. Characters that HTML does not
+// allow, and invisible ones that would show text in another order, become visible ones.
 #pragma once
 
 #include <initializer_list>

@@ -9,7 +9,7 @@ import subprocess
 import time
 
 SCRIPT = "com.example.<script>document.title='hostile'</script>&amp;\"'"
-OVERRIDE = "com.example.\u202egnp.exe\u202c\u2067"
+OVERRIDE = "com.example.\u202egnp.exe\u202c\u2067\u05d0\u05d1"
 LONG = "com.example." + "k" * 1000
 HOSTILE = (SCRIPT, OVERRIDE, LONG)
 TODAY = int(time.time() // 86400)

@@ -28,12 +28,14 @@ std::string attributes(const HtmlWriter& html, const std::string& name) {
 TEST(HtmlWriterTest, KeepsTextsText) {
   HtmlWriter html;
   html.begin("p", {{"title", "\"><script>'&"}, {"class", ""}});
-  html.text("<b>&amp;\n\t\x01\x7f\xff\u0085\uFFFE");
+  html.text("<b>&amp;\n\t\x01\x7f\xff\u0085\uFFFE\u202E\u2069\u05D0");
   html.name("a.b..<c");
   html.empty("br");
   html.end();
   EXPECT_EQ(html.written(),
-            "<p title=\"&quot;&gt;&lt;script&gt;'&amp;\">&lt;b&gt;&amp;amp;\n\t␁␡\uFFFD\uFFFD\uFFFD"
+            "<p "
+            "title=\"&quot;&gt;&lt;script&gt;'&amp;\">&lt;b&gt;&amp;amp;"
+            "\n\t␁␡\uFFFD\uFFFD\uFFFD\uFFFD\uFFFD\u05D0"
             "<bdi>a.<wbr>b.<wbr>.<wbr>&lt;c</bdi><br/></p>");
 }
 
