@@ -532,8 +532,20 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
     EXPECT_EQ(pwrite(leased.get(), &most, sizeof most, kBHHeaderDropped), 8);
   }
   EXPECT_EQ(foldNow().removed, 1U);
+
+  // One that was folded to its end is not read again.
+  run([] { add(1); });
+  const std::string ended = segments().at(0);
+  std::filesystem::copy_file(ended, root / "copy");
+  EXPECT_EQ(foldNow().removed, 1U);
+  std::filesystem::rename(root / "copy", ended);
+  {
+    const Descriptor writer(open(ended.c_str(), O_RDWR | O_CLOEXEC));
+    EXPECT_EQ(foldNow().segmentsRefused, 1U);
+  }
+  EXPECT_EQ(foldNow().removed, 1U);
   look();
-  EXPECT_EQ(scalar("count"), 3);
+  EXPECT_EQ(scalar("count"), 4);
   EXPECT_EQ(figure("dropped"), 1'000'000'000);
 }
 

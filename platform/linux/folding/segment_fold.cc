@@ -206,9 +206,19 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
       return Done{};
     }
   }
+  if (position.isEnd) {
+    if (isWriterGone) {
+      folded_.push_back({name, std::move(segment), {}, true});
+    } else {
+      refuse(folder_.refusal(segment.entry.name, "a copy of another segment"));
+    }
+    return Done{};
+  }
   SegmentIntake intake(name.owner, recorders_, rows_, changes_, buffers_);
   SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
   if (Status done = giveTo(batch, intake); !done) return done;
+  const bool isOver = isWriterGone && progress.isComplete;
+  if (isOver) position = SegmentPosition::end();
   if (const std::string after = position.encode(); after != before) {
     if (Status done = batch.setSegmentPosition(name.owner, name.identity, after); !done) {
       return done;
@@ -228,7 +238,6 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   values_[name.owner] += intake.values();
   counts_.refused += intake.refused() + progress.refused;
   counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
-  const bool isOver = isWriterGone && progress.isComplete;
   // A program that dropped values learns that there may be room again.
   if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
     folded_.push_back({name, std::move(segment), std::move(progress), isOver});

@@ -77,6 +77,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
       auto decoded = SegmentPosition::decode(**stored);
       if (!decoded) return Done{};
       position = *std::move(decoded);
+      if (position.isEnd) return Done{};
     }
   }
   SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffers);

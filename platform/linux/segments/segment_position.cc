@@ -9,8 +9,10 @@ namespace tavrel {
 namespace {
 
 // Layout, little-endian: u32 version, u32 cells, u32 chunks, u32 zero, u64 dropped, then the used
-// cells and chunks, each as its u32 number, which ascend, and its fields in order.
+// cells and chunks, each as its u32 number, which ascend, and its fields in order. The end of a
+// segment is another version alone.
 constexpr std::uint32_t kVersion = 2;
+constexpr std::uint32_t kEndVersion = 3;
 constexpr std::uint64_t kHeadBytes = 24;
 constexpr std::uint64_t kCellBytes = 20;
 constexpr std::uint64_t kChunkBytes = 12;
@@ -39,6 +41,11 @@ Part* nextPart(std::vector<Part>& parts, ByteSpan bytes, std::uint64_t at, std::
 }  // namespace
 
 std::string SegmentPosition::encode() const {
+  if (isEnd) {
+    std::string out;
+    append(out, kEndVersion);
+    return out;
+  }
   const std::uint32_t usedCells = countUsed(cells);
   const std::uint32_t usedChunks = countUsed(chunks);
   std::string out;
@@ -68,6 +75,7 @@ std::string SegmentPosition::encode() const {
 Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
   const Error refused{"not the position of a segment"};
   const ByteSpan bytes = asBytes(text);
+  if (bytes.size() == sizeof kEndVersion && loadLittle32(bytes, 0) == kEndVersion) return end();
   const std::uint32_t usedCells = loadLittle32(bytes, 4).value_or(0);
   const std::uint32_t usedChunks = loadLittle32(bytes, 8).value_or(0);
   if (loadLittle32(bytes, 0) != kVersion || usedCells > kBHCellCount ||

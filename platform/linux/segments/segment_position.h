@@ -2,7 +2,8 @@
 // each is taken once.
 //
 // The bytes of a position hold only what was folded of the segment, 20 bytes per cell and 12 per
-// chunk, whatever its header claims: nobody fills the store with positions of empty segments.
+// chunk, whatever its header claims: nobody fills the store with positions of empty segments. A
+// segment that was folded to its end, and to which nobody can write, needs no more than a mark.
 #pragma once
 
 #include <cstdint>
@@ -31,7 +32,9 @@ struct SegmentPosition {
   std::vector<Cell> cells;
   std::vector<Chunk> chunks;
   std::uint64_t dropped = 0;  // values that the program lost, as far as they have been reported
+  bool isEnd = false;         // nothing is left to fold, and never will be; the rest is empty
 
+  static SegmentPosition end() { return {.cells = {}, .chunks = {}, .isEnd = true}; }
   bool operator==(const SegmentPosition&) const = default;
 
   std::string encode() const;
