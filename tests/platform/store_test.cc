@@ -7,6 +7,7 @@
 
 #include "device_services.h"
 #include "platform/linux/store/kept_values.h"
+#include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/store_path.h"
@@ -496,7 +497,7 @@ TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
 
   const auto idle = reader->initWithDefaultPath();
   store_->BHClientCheckpoint();
-  EXPECT_EQ(std::filesystem::file_size(store_->path() + "-wal"), 0U);
+  EXPECT_FALSE(logHoldsPages(store_->path()));
   const std::int32_t tomorrow = kToday + 1;
   EXPECT_EQ(
       scalars(*idle, "", kSmallest, kLargest),
@@ -508,6 +509,28 @@ TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
     clock.time = plist::Date::since1970(time);
     EXPECT_EQ(open()->BHDaysSince1970(), day);
   }
+}
+
+TEST_F(StoreTest, AnEmptiedLogKeepsItsFileAndWhatItHeldIsPast) {
+  const std::string file = store_->path() + "-wal";
+  {
+    auto batch = store_->beginBatch();
+    const std::vector<DistributionSample> samples(200'000, {1.5, 0});
+    EXPECT_TRUE((*batch)->appendValues(kToday, "many", samples));
+    EXPECT_TRUE((*batch)->setScalar(kToday, "k", 1));
+    EXPECT_TRUE((*batch)->commit());
+  }
+  EXPECT_FALSE(logHoldsPages(store_->path()));
+  EXPECT_EQ(std::filesystem::file_size(file), kKeptLogBytes);
+  set({{"k", kToday, 2}});
+  EXPECT_TRUE(logHoldsPages(store_->path()));
+  // As after a power cut.
+  std::filesystem::remove(store_->path() + "-shm");
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 2}}));
+  store_->BHClientCheckpoint();
+  EXPECT_FALSE(logHoldsPages(store_->path()));
+  EXPECT_EQ(std::filesystem::file_size(file), kKeptLogBytes);
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 2}}));
 }
 
 TEST_F(StoreTest, ValuesOutlastALock) {
@@ -720,15 +743,24 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
     return signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &none) == 0;
   };
   restricted(full, "k=1;", readAll);
-  restricted(full,
-             where() + "disk I/O error (File too large): check the file system that holds it" +
-                 waits + "File too large",
-             writeAndTell);
+  restricted(
+      full,
+      where() + "disk I/O error: check the file system that holds it" + waits + "File too large",
+      writeAndTell);
   // The log is left there with its index, which is read where it cannot be written.
   const auto letOthersRead = [&] {
     for (const char* ending : {"", "-wal", "-shm"})
       EXPECT_EQ(chmod((store_->path() + ending).c_str(), 0644), 0);
   };
+  letOthersRead();
+  asAnother("k=1;", readAll);
+  // A writer that was alone leaves an empty index.
+  const std::string index = store_->path() + "-shm";
+  std::filesystem::remove(index);
+  store_->BHClientSetValueForScalarKey("k", 1);
+  EXPECT_TRUE(store_->commit());
+  EXPECT_EQ(std::filesystem::file_size(index), 0U);
+  EXPECT_EQ(FileSystem::status(index)->st_mode & 0777U, 0640U);
   letOthersRead();
   asAnother("k=1;", readAll);
   settle();

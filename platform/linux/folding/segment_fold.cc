@@ -94,7 +94,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
     refuse(line);
   if (listing.segments.empty() && counts_.segmentsRefused == 0) return Done{};
   do {
-    const auto batch = store_.beginBatch();
+    const auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
     // One damaged row must not keep all that programs recorded from the store.
     (*batch)->refuseUnwritableSeries();

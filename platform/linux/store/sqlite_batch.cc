@@ -6,6 +6,7 @@
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/store/distribution_writer.h"
+#include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
 
 namespace tavrel {
@@ -14,9 +15,6 @@ namespace {
 // Rows of either kind held back before they are written, in bytes. They are written in the order of
 // their keys: the more there are, the fewer pages are written twice.
 constexpr std::size_t kPendingBytes = 16U << 20;
-
-// A longer log is moved into the database after a commit.
-constexpr off_t kLogBytes = 1 << 20;
 
 void checkKey(std::string_view key) {
   if (key.size() <= limits::kStoreKeyBytes) return;
@@ -294,7 +292,8 @@ SqliteConnection SqliteBatch::release() {
 // The changes are kept already, so that the log may stay as it is for now.
 void SqliteBatch::limitLog() {
   const auto log = FileSystem::status(site_.path + "-wal");
-  if (!log || log->st_size <= kLogBytes) return;
+  // A shorter one may be a file that is kept for the next commits.
+  if (!log || log->st_size <= kKeptLogBytes) return;
   try {
     connection_.checkpoint(false);
   } catch (const StoreFailure& failure) {

@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
+#include <optional>
 #include <sqlite3.h>
 #include <thread>
 #include <unistd.h>
@@ -11,6 +12,7 @@
 
 #include "platform/linux/store/sqlite_index_room.h"
 #include "platform/linux/store/sqlite_library.h"
+#include "platform/linux/store/sqlite_log_file.h"
 
 namespace tavrel {
 namespace {
@@ -144,8 +146,11 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
     case Access::Create:
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
+    case Access::WriteAlone:
+      flags |= SQLITE_OPEN_READWRITE;
+      break;
     case Access::Read:
-    case Access::Alone:
+    case Access::ReadAlone:
       // A user who may write can use a log that has no index. SQLite opens a write-protected file
       // for reading.
       flags |= SQLITE_OPEN_READWRITE;
@@ -165,7 +170,9 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
     sqlite().db_config(handle_, SQLITE_DBCONFIG_TRUSTED_SCHEMA, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_TRIGGER, 0, nullptr);
     sqlite().db_config(handle_, SQLITE_DBCONFIG_ENABLE_VIEW, 0, nullptr);
-    if (access == Access::Alone) execute("PRAGMA locking_mode = EXCLUSIVE");
+    if (access == Access::ReadAlone || access == Access::WriteAlone) {
+      execute("PRAGMA locking_mode = EXCLUSIVE");
+    }
     // Closing leaves the log: moving it each time would write every page twice for one commit.
     sqlite().db_config(handle_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
     execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512; PRAGMA secure_delete = FAST");
@@ -201,7 +208,9 @@ std::int64_t SqliteConnection::integer(std::string_view sql) {
   return statement.step() ? statement.integer(0) : 0;
 }
 
-bool SqliteConnection::checkpoint(bool waits) {
+bool SqliteConnection::checkpoint(bool waits, LogFile file) {
+  std::optional<KeptLogFile> kept;
+  if (file == LogFile::Kept) kept.emplace(handle_);
   if (!waits) sqlite().busy_handler(handle_, nullptr, nullptr);
   const int code =
       sqlite().wal_checkpoint_v2(handle_, nullptr, SQLITE_CHECKPOINT_TRUNCATE, nullptr, nullptr);

@@ -61,10 +61,11 @@ class BusyBudget {
 class SqliteConnection {
  public:
   enum class Access : std::uint8_t {
-    Create,     // read and write; an absent file is created
-    Read,       // read; uses the write-ahead log as far as the user may
-    Alone,      // read; keeps all others out, and needs no file for the log's index
-    Immutable,  // read a file that no process writes, without locks or a log
+    Create,      // read and write; an absent file is created
+    WriteAlone,  // read and write; keeps all others out, and needs no file for the log's index
+    Read,        // read; uses the write-ahead log as far as the user may
+    ReadAlone,   // read; keeps all others out, and needs no file for the log's index
+    Immutable,   // read a file that no process writes, without locks or a log
   };
 
   SqliteConnection(const std::string& path, Access access, std::shared_ptr<BusyBudget> busy);
@@ -78,10 +79,15 @@ class SqliteConnection {
   /// The first column of the first row.
   std::int64_t integer(std::string_view sql);
 
+  enum class LogFile : std::uint8_t {
+    Kept,    // keeps its blocks for the next commits; see sqlite_log_file.h
+    CutOff,  // nothing of what it held is left in it
+  };
+
   /// Moves the write-ahead log into the database and empties it. False when other processes
   /// prevented part of that, for as long as is waited for them; as much as possible has then been
   /// moved.
-  bool checkpoint(bool waits = true);
+  bool checkpoint(bool waits = true, LogFile file = LogFile::Kept);
 
   sqlite3* handle() const { return handle_; }
 

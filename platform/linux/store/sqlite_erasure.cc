@@ -71,7 +71,8 @@ StoreErasure::StoreErasure(SqliteConnection& connection, std::string storePath)
 
 void StoreErasure::limitLog() {
   const auto log = FileSystem::status(path_ + "-wal");
-  if (log && log->st_size > kLogBytes) connection_.checkpoint(false);
+  if (log && log->st_size > kLogBytes)
+    connection_.checkpoint(false, SqliteConnection::LogFile::CutOff);
 }
 
 // Rows of zeros take the free pages, as many as there are, and give them back.

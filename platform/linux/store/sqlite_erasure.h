@@ -56,7 +56,7 @@ class StoreErasure {
   /// nothing is done, for a store that would keep other writers waiting for long.
   bool copyPages();
   /// False while other processes need the log.
-  bool emptyLog() { return connection_.checkpoint(); }
+  bool emptyLog() { return connection_.checkpoint(true, SqliteConnection::LogFile::CutOff); }
 
  private:
   void eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased);

@@ -10,6 +10,7 @@
 
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/chunk_runs.h"
+#include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_site.h"
 
 namespace tavrel {
@@ -86,10 +87,8 @@ bool checkIsFile(const std::string& path) {
 // A journal is left where another program has put the store in SQLite's older mode.
 bool hasLog(const std::string& path) {
   struct stat status;
-  for (const char* suffix : {"-wal", "-journal"}) {
-    if (stat((path + suffix).c_str(), &status) == 0 && status.st_size != 0) return true;
-  }
-  return false;
+  return logHoldsPages(path) ||
+         (stat((path + "-journal").c_str(), &status) == 0 && status.st_size != 0);
 }
 
 // The file's version, from which on each change shows. Many file systems stamp changes with a clock
@@ -108,6 +107,41 @@ std::optional<FileVersion> settledVersion(const std::string& path) {
             kStep;
     if (!isRecent || attempt == 3) return version;
     nanosleep(&kPause, nullptr);
+  }
+}
+
+void setUpForWriting(SqliteConnection& connection) {
+  // Each commit is flushed: what was reported as kept also survives a power cut.
+  connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
+  // SQLite's own checkpoint leaves the log's content there. The next process to open the store
+  // would not know that it has been moved, and would move it again.
+  connection.execute("PRAGMA wal_autocheckpoint = 0");
+}
+
+// Who may only read the store can use the log when there is a file for its index, whatever it
+// holds. SQLite makes none for a connection that keeps all others out.
+void provideIndexFile(const std::string& path) {
+  const std::string index = path + "-shm";
+  struct stat status;
+  if (stat(index.c_str(), &status) == 0 || stat(path.c_str(), &status) != 0) return;
+  const Descriptor made(open(index.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
+  if (!made) return;
+  if (geteuid() == 0) static_cast<void>(fchown(made.get(), status.st_uid, status.st_gid));
+  static_cast<void>(fchmod(made.get(), status.st_mode & 0666));
+}
+
+// The store for this process alone; nothing when that takes waiting, or more than opening it.
+std::optional<SqliteConnection> openAlone(const std::string& path) {
+  try {
+    SqliteConnection connection(path, SqliteConnection::Access::WriteAlone,
+                                std::make_shared<BusyBudget>(0));
+    if (schemaVersion(connection) != kSchemaVersion) return std::nullopt;
+    setUpForWriting(connection);
+    provideIndexFile(path);
+    return connection;
+  } catch (const StoreFailure&) {
+    // Whoever opens it in the usual way tells.
+    return std::nullopt;
   }
 }
 
@@ -178,13 +212,16 @@ void migrate(SqliteConnection& connection) {
 }
 
 SqliteConnection openStoreForWriting(const std::string& path,
-                                     const std::shared_ptr<BusyBudget>& busy) {
+                                     const std::shared_ptr<BusyBudget>& busy, Sharing sharing) {
   // SQLite gives its log files the mode of the store, and would create a store that all can read.
   // An existing store is not opened for this: closing it would give up SQLite's locks.
   if (!checkIsFile(path)) {
     const Descriptor made(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0640));
   }
   withholdFromOthers(path);
+  if (sharing == Sharing::Avoided) {
+    if (auto connection = openAlone(path)) return std::move(*connection);
+  }
   SqliteConnection connection(path, SqliteConnection::Access::Create, busy);
   std::int64_t version = schemaVersion(connection);
   if (version == 0) {
@@ -203,11 +240,7 @@ SqliteConnection openStoreForWriting(const std::string& path,
     }
   }
   if (!isKnown(version)) refuseSchema(version);
-  // Each commit is flushed: what was reported as kept also survives a power cut.
-  connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
-  // SQLite's own checkpoint leaves the log's content there. The next process to open the store
-  // would not know that it has been moved, and would move it again.
-  connection.execute("PRAGMA wal_autocheckpoint = 0");
+  setUpForWriting(connection);
   return connection;
 }
 
@@ -232,7 +265,7 @@ std::optional<ReadableStore> openStoreForReading(const std::string& path,
     // Using the log needs files in the store's folder, and room for them.
     if (failure.fault != StoreFault::Refused && failure.fault != StoreFault::Device) throw;
     if (hasLog(path)) {
-      if (failure.fault == StoreFault::Device) return openAs(Access::Alone);
+      if (failure.fault == StoreFault::Device) return openAs(Access::ReadAlone);
       if (faccessat(AT_FDCWD, path.c_str(), R_OK, AT_EACCESS) != 0) throw;
       throw StoreFailure{failure.fault,
                          failure.message +

@@ -56,10 +56,19 @@ std::int64_t schemaVersion(SqliteConnection& connection);
 /// Gives a store of version 1 the present schema, in the transaction that has begun, and ends it.
 void migrate(SqliteConnection& connection);
 
+enum class Sharing : std::uint8_t {
+  WithReaders,
+  /// Readers wait until the connection is closed; where one is there already, it is shared after
+  /// all. The log's index is then in memory, and no file of it wears out the flash. For changes
+  /// that are soon done.
+  Avoided,
+};
+
 /// Opens the store for writing and gives an empty file the schema; a store of version 1 keeps its
 /// own. The folder must exist.
 SqliteConnection openStoreForWriting(const std::string& path,
-                                     const std::shared_ptr<BusyBudget>& busy);
+                                     const std::shared_ptr<BusyBudget>& busy,
+                                     Sharing sharing = Sharing::WithReaders);
 
 struct ReadableStore {
   SqliteConnection connection;

@@ -10,7 +10,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "platform/guarded.h"
-#include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_log_file.h"
 #include "platform/store_path.h"
 
 namespace tavrel {
@@ -51,7 +51,7 @@ void SqliteStore::BHClientSetValueForScalarKey(std::string_view key, std::int64_
   pending_[{BHDaysSince1970(), std::string(key)}] = value;
 }
 
-SqliteConnection SqliteStore::openForWriting() {
+SqliteConnection SqliteStore::openForWriting(Sharing sharing) {
   const std::filesystem::path folder = std::filesystem::path(site_.path).parent_path();
   std::error_code code;
   std::filesystem::create_directories(folder, code);
@@ -61,7 +61,7 @@ SqliteConnection SqliteStore::openForWriting() {
     throw StoreFailure{StoreFault::Refused, "its folder cannot be made: " + code.message() + ": " +
                                                 adviceFor(code.value(), checkOwner.c_str())};
   }
-  return openStoreForWriting(site_.path, site_.busy);
+  return openStoreForWriting(site_.path, site_.busy, sharing);
 }
 
 template <class Operation>
@@ -86,7 +86,7 @@ bool SqliteStore::commit() {
 bool SqliteStore::commit(std::optional<SqliteConnection>& connection) {
   if (pending_.empty() && !KeptValues(site_.path).exist()) return true;
   const auto failure = attempt([&](const auto&) {
-    SqliteBatch batch(openForWriting(), site_);
+    SqliteBatch batch(openForWriting(Sharing::Avoided), site_);
     for (const auto& [name, value] : pending_)
       batch.putScalar(name.first, name.second, value);
     batch.finish();
@@ -135,12 +135,11 @@ bool SqliteStore::BHClientCheckpoint() {
 }
 
 void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
-  const auto log = FileSystem::status(site_.path + "-wal");
-  if (!log || log->st_size == 0) return;
+  if (!logHoldsPages(site_.path)) return;
   const auto failure = attempt([&](const auto& identity) {
     // The store has just been set aside with its log.
     if (!identity) return;
-    if (!connection) connection = openForWriting();
+    if (!connection) connection = openForWriting(Sharing::Avoided);
     if (!connection->checkpoint()) {
       site_.log.write(LogLevel::Default,
                       site_.describe({StoreFault::Busy,
@@ -155,7 +154,7 @@ Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
   ErasedRows erased;
   const auto failure = attempt([&](const auto& identity) {
     if (!identity && !KeptValues(site_.path).exist()) return;
-    SqliteBatch batch(openForWriting(), site_);
+    SqliteBatch batch(openForWriting(Sharing::WithReaders), site_);
     batch.begin();
     batch.finish();
     SqliteConnection connection = batch.release();
@@ -196,10 +195,10 @@ Expected<std::unique_ptr<SqliteHistory>> SqliteStore::openHistory() {
   return history;
 }
 
-Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch() {
+Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch(Sharing sharing) {
   std::unique_ptr<SqliteBatch> batch;
-  const auto failure =
-      attempt([&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(), site_); });
+  const auto failure = attempt(
+      [&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(sharing), site_); });
   if (failure) return Error{site_.describe(*failure)};
   return batch;
 }
@@ -207,7 +206,7 @@ Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch() {
 Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {
   std::unique_ptr<SqliteTrim> trim;
   const auto failure = attempt([&](const auto& identity) {
-    if (identity) trim = std::make_unique<SqliteTrim>(openForWriting(), site_);
+    if (identity) trim = std::make_unique<SqliteTrim>(openForWriting(Sharing::WithReaders), site_);
   });
   if (failure) return Error{site_.describe(*failure)};
   return trim;

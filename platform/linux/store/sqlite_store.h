@@ -27,6 +27,7 @@
 #include "platform/linux/store/sqlite_batch.h"
 #include "platform/linux/store/sqlite_erasure.h"
 #include "platform/linux/store/sqlite_history.h"
+#include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_site.h"
 #include "platform/linux/store/sqlite_trim.h"
 #include "platform/preferences.h"
@@ -59,7 +60,7 @@ class SqliteStore : public StatisticsStore {
   const std::string& path() const { return site_.path; }
 
   /// A transaction of many changes; the store is created when there is none.
-  Expected<std::unique_ptr<SqliteBatch>> beginBatch();
+  Expected<std::unique_ptr<SqliteBatch>> beginBatch(Sharing sharing = Sharing::WithReaders);
 
   /// To remove days; null when there is no store.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
@@ -72,7 +73,7 @@ class SqliteStore : public StatisticsStore {
   Expected<ErasedRows> erase(const RowRange& range);
 
  private:
-  SqliteConnection openForWriting();
+  SqliteConnection openForWriting(Sharing sharing);
   /// Keeps the values that a failure has left uncommitted. False when they could not be kept.
   bool keep(const StoreFailure& failure);
   /// As above; hands on the connection when something was committed.

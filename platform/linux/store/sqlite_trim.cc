@@ -10,6 +10,7 @@
 #include <utility>
 
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
 
 namespace tavrel {
@@ -25,8 +26,6 @@ constexpr std::int64_t kStepPages = 256;
 
 // Others look for the lock every five milliseconds.
 constexpr timespec kPause{0, 10'000'000};
-
-constexpr off_t kLogBytes = 1 << 20;
 
 // A conversion copies the store through memory into its log, and other writers wait meanwhile:
 // a second or two on slow flash.
@@ -105,7 +104,7 @@ Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::in
       const bool goesOn = step(budget);
       connection_.execute("COMMIT");
       hasAdvanced = true;
-      limitLog(kLogBytes);
+      limitLog(kKeptLogBytes);
       if (!goesOn) return Done{};
     } catch (const StoreFailure& failure) {
       try {
