@@ -118,6 +118,19 @@ def fill(device, logs):
     return outbox
 
 
+def permit_upload(device, server):
+    """Has the device send its logs to the server, and yields the environment of tavrel-upload."""
+    os.makedirs(device.path("etc/tavrel"))
+    with open(device.path("etc/tavrel/upload.plist"), "wb") as file:
+        file.write(plistlib.dumps({"URL": server.url()}))
+    credentials = device.path("credentials")
+    os.makedirs(credentials)
+    for credential, name in (("certificate", "device.crt"), ("key", "device.key"),
+                             ("authority", "ca.crt")):
+        shutil.copy(server.path(name), os.path.join(credentials, f"tavrel-upload.{credential}"))
+    return {**device.environment, "CREDENTIALS_DIRECTORY": credentials}
+
+
 def timed(command, device, environment):
     """Wall and CPU seconds, and the peak of memory in MiB."""
     peak = device.path("peak")
@@ -140,15 +153,7 @@ def main():
     device = Device(sys.argv[1])
     server = Server(device.path("server"))
     logs = make_logs()
-    os.makedirs(device.path("etc/tavrel"))
-    with open(device.path("etc/tavrel/upload.plist"), "wb") as file:
-        file.write(plistlib.dumps({"URL": server.url()}))
-    credentials = device.path("credentials")
-    os.makedirs(credentials)
-    for credential, name in (("certificate", "device.crt"), ("key", "device.key"),
-                             ("authority", "ca.crt")):
-        shutil.copy(server.path(name), os.path.join(credentials, f"tavrel-upload.{credential}"))
-    environment = {**device.environment, "CREDENTIALS_DIRECTORY": credentials}
+    environment = permit_upload(device, server)
 
     uploads, curls = [], []
     for _ in range(RUNS):

@@ -17,6 +17,8 @@ LIMITS = {
     "report sample of 10,000 channels, MiB": 64.0,
     "24 folds: ratio to the content": 5.0,
     "24 folds of 7 values a second, MB": 22.0,
+    "ordinary day: written to flash, MB": 3.0,
+    "ordinary day: CPU, s": 5.0,
     "service: memory when idle, MiB": 8.0,
     "stat add: ratio to an empty program": 2.0,
     # 20 values at 66,200 in a second of CPU time.
