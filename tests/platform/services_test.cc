@@ -70,7 +70,7 @@ TEST_F(ServicesTest, SystemVersionIsReadOrMadeFromOsRelease) {
   }
 }
 
-TEST_F(ServicesTest, CrashReportingKeepsRecordsPerTypeAndDayForThirtyDays) {
+TEST_F(ServicesTest, CrashReportingKeepsRecordsPerTypeOfThirtyOneDays) {
   const std::string folder = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
   const std::byte bytes[] = {std::byte{0xAB}, std::byte{0x01}};
   reporting.FLLogStructuredData(
@@ -85,14 +85,25 @@ TEST_F(ServicesTest, CrashReportingKeepsRecordsPerTypeAndDayForThirtyDays) {
             R"("te\"xt":"a\nb"}})"
             "\n");
 
-  for (const char* name : {"172-2026-10-27.jsonl", "176-1999-01-01.jsonl", "172-2026-10-28.jsonl",
-                           "172-2030-01-01.jsonl", "notes.txt", "x172-1999-01-01.jsonl"}) {
-    write(folder + name, "x\n");
-  }
+  // Of 32 days one goes: one that has not come, otherwise the oldest.
+  Lines kept{"notes.txt",
+             "x172-1999-01-01.jsonl",
+             "172-1999-01-01.jsonl",
+             "176-1999-01-01.jsonl",
+             "172-2026-11-28.jsonl",
+             "172-2026-11-27.jsonl"};
+  for (int day = 1; day <= 28; ++day)
+    kept.push_back(format("176-2026-01-%02d.jsonl", day));
+  for (const std::string& name : kept)
+    if (!name.ends_with("11-27.jsonl")) write(folder + name, "x\n");
+  std::sort(kept.begin(), kept.end());
+  write(folder + "172-2030-01-01.jsonl", "x\n");
   reporting.FLDumpAllOldStructuredDataLogs();
-  EXPECT_EQ(*files.list(root.path(folder)),
-            (Lines{"172-2026-10-28.jsonl", "172-2026-11-27.jsonl", "172-2030-01-01.jsonl",
-                   "notes.txt", "x172-1999-01-01.jsonl"}));
+  EXPECT_EQ(*files.list(root.path(folder)), kept);
+  write(folder + "172-1999-01-02.jsonl", "x\n");
+  reporting.FLDumpAllOldStructuredDataLogs();
+  EXPECT_EQ(files.list(root.path(folder))->at(0), "172-1999-01-02.jsonl");
+  EXPECT_EQ(files.list(root.path(folder))->size(), kept.size() - 1);
   EXPECT_TRUE(log.lines.empty());
 }
 

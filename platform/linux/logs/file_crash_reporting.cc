@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <array>
+#include <iterator>
+#include <set>
 #include <utility>
 
 #include "base/limits.h"
@@ -82,10 +84,20 @@ std::vector<std::string> FileCrashReporting::oldRecordFiles() {
     log_.write(LogLevel::Error, files.error().message);
     return {};
   }
-  const std::int64_t today = dayOf(clock_.now());
-  std::erase_if(*files, [today](const std::string& name) {
+  // In the order in which days go.
+  const std::int64_t tomorrow = dayOf(clock_.now()) + 1;
+  const auto rank = [tomorrow](const RecordFileName& file) {
+    return std::pair(file.day <= tomorrow, file.day);
+  };
+  std::set<std::pair<bool, std::int64_t>> days;
+  for (const std::string& name : *files) {
+    if (const auto file = parseRecordFileName(name)) days.insert(rank(*file));
+  }
+  if (days.size() <= kDaysKept) return {};
+  const auto firstKept = *std::prev(days.end(), kDaysKept);
+  std::erase_if(*files, [&](const std::string& name) {
     const auto file = parseRecordFileName(name);
-    return !file || file->day >= today - kDaysKept;
+    return !file || rank(*file) >= firstKept;
   });
   return *std::move(files);
 }

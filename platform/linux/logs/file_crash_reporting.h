@@ -27,8 +27,9 @@ namespace tavrel {
 
 class FileCrashReporting final : public CrashReporting {
  public:
-  /// Days for which structured records are kept.
-  static constexpr std::int64_t kDaysKept = 30;
+  /// Days of which structured records are kept, whatever their dates: a clock that goes wrong must
+  /// not make all of them old. Beyond these, days after tomorrow go first, then the oldest.
+  static constexpr std::size_t kDaysKept = 31;
   /// Rolled support logs that are kept.
   static constexpr int kSupportLogsKept = 5;
 
