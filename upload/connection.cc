@@ -115,6 +115,7 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
   set(handle, CURLOPT_ERRORBUFFER, words.data());
   const CURLcode code = curl_easy_perform(handle);
   set(handle, CURLOPT_ERRORBUFFER, static_cast<char*>(nullptr));
+  isMisconfigured_ = code == CURLE_SSL_CERTPROBLEM || code == CURLE_SSL_CACERT_BADFILE;
   if (transfer.answerBytes > limits::kUploadAnswerBytes) return Error{"the answer is too long"};
   if (code != CURLE_OK) return Error{words[0] != '\0' ? words.data() : curl_easy_strerror(code)};
 

@@ -42,10 +42,15 @@ class Connection {
   Expected<Answer> put(const std::string& url, const std::vector<std::string>& headers,
                        std::string_view body, std::chrono::milliseconds longest, const GoOn& goOn);
 
+  /// Whether the last error was about the device's own certificate, key or authorities, which no
+  /// later attempt cures.
+  bool isMisconfigured() const { return isMisconfigured_; }
+
  private:
   struct Transfer;
   const Configuration& configuration_;
   std::unique_ptr<void, void (*)(void*)> handle_;
+  bool isMisconfigured_ = false;
 };
 
 }  // namespace tavrel::upload

@@ -54,6 +54,8 @@ int upload(SystemLog& log, bool atOnce) {
       return kDone;
     case Outcome::Waits:
       return kWaits;
+    case Outcome::Misconfigured:
+      return kMisconfigured;
     case Outcome::Failed:
       break;
   }

@@ -102,7 +102,7 @@ Outcome Uploader::run(bool atOnce) {
     state_.failure = complaint_;
     state_.lastFailure = services_.clock.now();
     ++state_.failedAttempts;
-    outcome = Outcome::Failed;
+    if (outcome != Outcome::Misconfigured) outcome = Outcome::Failed;
   }
   if (tried_ || !complaint_.empty()) {
     if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
@@ -168,6 +168,8 @@ Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
           return Outcome::Waits;
         case Step::Withdrawn:
           return removeWaiting();
+        case Step::Misconfigured:
+          return Outcome::Misconfigured;
       }
     }
     // What came meanwhile, and what was changed. A pass that sends nothing is the last.
@@ -205,6 +207,11 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
                        [this] { return permission() == Permission::Given; });
   if (answer) return judge(log, *answer, **packed);
   if (const Step asked = askPermission(); asked != Step::Next) return asked;
+  if (connection_->isMisconfigured()) {
+    complain(format("cannot send logs: %s: correct the credentials of tavrel-upload",
+                    answer.error().message));
+    return Step::Misconfigured;
+  }
   return fail(log, answer.error().message);
 }
 

@@ -40,9 +40,10 @@ struct Services {
 void noteFailure(const Services& services, std::string_view why);
 
 enum class Outcome {
-  Done,    // nothing is left to do
-  Waits,   // logs wait for a later run
-  Failed,  // something on the device is not in order
+  Done,           // nothing is left to do
+  Waits,          // logs wait for a later run
+  Failed,         // something on the device is not in order
+  Misconfigured,  // no log can be sent until somebody corrects a credential
 };
 
 class Uploader {
@@ -54,7 +55,7 @@ class Uploader {
 
  private:
   enum class Permission { Given, Withdrawn, NotGiven };
-  enum class Step { Next, Stop, Withdrawn };
+  enum class Step { Next, Stop, Withdrawn, Misconfigured };
 
   Permission permission();
   Outcome runLocked(bool atOnce);

@@ -38,7 +38,11 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
     EXPECT_EQ(device.run(true), Outcome::Waits);
     EXPECT_NE(device.log.lines.back().find(why), std::string::npos) << device.log.lines.back();
   }
-  EXPECT_EQ(device.state().failedAttempts, 5);
+  device.use(server, nginx.folder, "ca", "device");
+  device.configuration.key = nginx.folder + "other.key";
+  EXPECT_EQ(device.run(true), Outcome::Misconfigured);
+  EXPECT_TRUE(device.log.lines.back().ends_with(": correct the credentials of tavrel-upload"));
+  EXPECT_EQ(device.state().failedAttempts, 6);
   EXPECT_EQ(device.names().size(), 10U);
 
   device.use(server, nginx.folder, "ca", "device");
