@@ -65,7 +65,17 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   // A clock that is behind what is recorded.
   device.run("deny");
   device.run("stat import", format("scalar\t%d\tk\t1\n", today + 5));
-  EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 6);
+  const Outcome ahead = device.run("allow --json");
+  EXPECT_EQ(ahead.error, "tavrelctl: day " + text(today + 5) +
+                             " is recorded already, though today "
+                             "is " +
+                             text(today) +
+                             ": submission begins after it; give --from DAY "
+                             "if a wrong clock recorded it\n");
+  device.check("allow", prints("submission is already " + allowed(today + 6) + "\n"));
+  device.check("allow --from=-1", fails("day -1 (1969-12-31) is before 1970: give a number of days "
+                                        "since then",
+                                        2));
   device.check(
       "allow --from soon",
       fails("not a day: soon: give today, yesterday, a 32-bit day number or YYYY-MM-DD", 2));
@@ -87,20 +97,24 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
   device.run("prefs set " + kSwitch + " true --bool");
   EXPECT_EQ(device.json("status")["submission_first_day"], nullptr);
   device.check("allow", prints("submission is already allowed\n"));
+  const std::string kCount = "an integer of 0 to 2147483647, not ";
   for (const auto& [key, value, wrong, right] :
-       {std::array{kSwitch.c_str(), "yes", "a boolean, not \"yes\"", ""},
+       {std::array<std::string, 4>{kSwitch, "yes", "a boolean, not \"yes\"", ""},
         {"com.norvane.NANDInfo userWAmp", "10 --int", "a number above 0 and below 10, not 10",
          "2.5 --float"},
-        {"com.norvane.da AggressiveSubmissionDays", "1.5 --float", "an integer, not 1.5",
-         "3 --int"}}) {
-    const std::string name = key;
-    const std::size_t space = name.find(' ');
-    const std::string set = "prefs set " + name + " " + value;
+        {"com.norvane.da AggressiveSubmissionDays", "1.5 --float", kCount + "1.5", "3 --int"},
+        {"com.norvane.da Radio", "no", "a boolean, not \"no\"", "true|false --bool"},
+        {"com.norvane.zentrix com.norvane.x", "1 --int", "a boolean, not 1", "true|false --bool"},
+        {"com.norvane.zentrix DiagnosticSubmissionFirstDay", "2147483648 --int",
+         kCount + "2147483648", ""},
+        {"com.norvane.tallied DatabaseCorruptionCount", "-1 --int", kCount + "-1", "3 --int"}}) {
+    const std::size_t space = key.find(' ');
+    const std::string set = "prefs set " + key + " " + value;
     device.check(
-        set, fails("preference " + name.substr(space + 1) + " of domain " + name.substr(0, space) +
+        set, fails("preference " + key.substr(space + 1) + " of domain " + key.substr(0, space) +
                        " is " + wrong + ": " +
-                       (*right == 0 ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
-                                    : "give 'tavrelctl prefs set " + name + " " + right + "'") +
+                       (right.empty() ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
+                                      : "give 'tavrelctl prefs set " + key + " " + right + "'") +
                        ", or store it all the same with --force",
                    2));
     EXPECT_EQ(device.run(set + " --force").status, 0);
@@ -178,6 +192,7 @@ TEST_F(Consent, ErasesDaysOrAll) {
     EXPECT_TRUE(path.find(".log") == std::string::npos && path.find("corrupt") == std::string::npos)
         << path;
   device.check("stat list", prints("no statistics\n"));
+  device.check("erase --yes --all", prints("nothing to erase\n"));
 }
 
 }  // namespace

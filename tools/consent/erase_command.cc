@@ -183,6 +183,12 @@ void print(ToolContext& context, const Scope& scope, const Erased& erased) {
     return counted(std::uint64_t{number}, what);
   };
   std::ostream& out = context.out();
+  if (rows.scalars + rows.distributions + rows.damaged + erased.recordFiles + erased.asideFiles +
+          erased.logs ==
+      0) {
+    out << "nothing to erase\n";
+    return;
+  }
   out << "erased: " << counted(rows.scalars, "scalar") << ", "
       << counted(rows.distributions, "distribution") << " of " << counted(rows.values, "value");
   if (scope.records) out << ", " << count(erased.recordFiles, "file") << " of records";
@@ -201,9 +207,8 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const Erased& erase
   }
   if (!rows.isCopied) {
     context.note(
-        "the store is too large to copy: parts of its pages without rows may still have single "
-        "keys "
-        "or values of what was erased");
+        "the store is too large to copy: parts of its pages without rows may still have "
+        "single keys or values of what was erased");
   }
   if (scope.logs) return;
   if (rows.damaged > 0) {

@@ -63,12 +63,6 @@ Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today)
   if (last == std::numeric_limits<std::int32_t>::max()) {
     return Error{"no day is later than what is recorded: erase that, or give --from DAY"};
   }
-  if (last > today) {
-    context.note(
-        format("day %s is recorded already, though today is %s: submission begins after "
-               "it; give --from DAY if a wrong clock recorded it",
-               dayText(last), dayText(today)));
-  }
   return last + 1;
 }
 
@@ -99,6 +93,10 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   const bool isNamed = !arguments.from.empty();
   auto first = parseDay(arguments.from, today);
   if (isNamed && !first) return context.failUsage(first.error().message);
+  if (isNamed && *first < 0) {
+    return context.failUsage(
+        format("day %s is before 1970: give a number of days since then", dayText(*first)));
+  }
   if (!isNamed && stored->isGiven && !stored->firstDay)
     return printAllowed(context, *stored, false);
   if (!isNamed) first = firstDayFromNow(context, today);
@@ -126,9 +124,14 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
                : context.fail("the permission was changed at the same moment: run it again");
   }
   printAllowed(context, permission, true);
-  if (*first <= today && !context.json()) {
+  if (*first <= today) {
     context.note(format("what was recorded from day %s on may leave, before this moment too",
                         dayText(*first)));
+  } else if (!isNamed && *first - 1 > today) {
+    context.note(
+        format("day %s is recorded already, though today is %s: submission begins after "
+               "it; give --from DAY if a wrong clock recorded it",
+               dayText(*first - 1), dayText(today)));
   }
 }
 

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <array>
+#include <cstdint>
+#include <limits>
 
 #include "base/format.h"
 #include "tools/shared/value_text.h"
@@ -15,9 +17,12 @@ struct Form {
   bool (*fits)(const plist::Value& value);
 };
 
-bool isInteger(const plist::Value& value) {
+// A day since 1970, or a number of days or of other things: what the daemon reads of both is 32
+// bits.
+bool isCount(const plist::Value& value) {
   const auto number = value.number();
-  return number && !number->isFloating();
+  return number && !number->isFloating() && number->int64() >= 0 &&
+         number->int64() <= std::numeric_limits<std::int32_t>::max();
 }
 
 bool isAmplification(const plist::Value& value) {
@@ -27,7 +32,7 @@ bool isAmplification(const plist::Value& value) {
 
 constexpr Form kBoolean{"a boolean", "true|false --bool",
                         [](const plist::Value& value) { return value.boolean().has_value(); }};
-constexpr Form kInteger{"an integer", "3 --int", isInteger};
+constexpr Form kCount{"an integer of 0 to 2147483647", "3 --int", isCount};
 constexpr Form kString{"a string", "TEXT --string",
                        [](const plist::Value& value) { return value.string().has_value(); }};
 constexpr Form kDate{"a date", "2026-11-27T18:02:18Z --date",
@@ -35,27 +40,33 @@ constexpr Form kDate{"a date", "2026-11-27T18:02:18Z --date",
 constexpr Form kDictionary{"a dictionary", "@FILE --plist", [](const plist::Value& value) {
                              return static_cast<bool>(value.dictionary());
                            }};
+constexpr Form kArray{"an array", "@FILE --plist",
+                      [](const plist::Value& value) { return static_cast<bool>(value.array()); }};
 constexpr Form kAmplification{"a number above 0 and below 10", "2.5 --float", isAmplification};
 
 struct KnownPreference {
   std::string_view domain;
-  std::string_view key;
+  std::string_view key;  // empty: every other one of the domain
   const Form& form;
 };
 
-// Those of docs/files.md that have a name of their own.
+// Those of docs/files.md. In two domains the other keys are named after something that they switch.
 constexpr std::array kKnown = {
     KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionEnabled", kBoolean},
-    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kInteger},
-    KnownPreference{"com.norvane.zentrix", "com.norvane.zentrix.tallied.tavrel", kBoolean},
-    KnownPreference{"com.norvane.da", "AggressiveSubmissionDays", kInteger},
+    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kCount},
+    KnownPreference{"com.norvane.zentrix", "", kBoolean},
+    KnownPreference{"com.norvane.da", "AggressiveSubmissionDays", kCount},
+    KnownPreference{"com.norvane.da", "", kBoolean},
     KnownPreference{"com.norvane.Drovelink", "ScheduledTasking", kDictionary},
     KnownPreference{"com.norvane.tallied.tavrel", "LastCrashLogSerializationDateInDaysSince1970",
-                    kInteger},
+                    kCount},
     KnownPreference{"com.norvane.tallied.tavrel", "LastLogOutcome", kString},
     KnownPreference{"com.norvane.tallied.tavrel", "LastOSVersion", kString},
     KnownPreference{"com.norvane.tallied.tavrel", "LastOSUpdate", kDictionary},
-    KnownPreference{"com.norvane.tallied", "DatabaseCorruptionCount", kInteger},
+    KnownPreference{"com.norvane.tallied.tavrel", "TaskingID", kString},
+    KnownPreference{"com.norvane.tallied.tavrel", "TaskingOS", kString},
+    KnownPreference{"com.norvane.tallied.tavrel", "TaskingPayload", kArray},
+    KnownPreference{"com.norvane.tallied", "DatabaseCorruptionCount", kCount},
     KnownPreference{"com.norvane.NANDInfo", "userWAmp", kAmplification},
     KnownPreference{"com.norvane.zentrix.tavrel", "SSLastLoggedAt", kDate},
     KnownPreference{"com.norvane.demo-settings", "StoreDemoMode", kBoolean},
@@ -65,9 +76,10 @@ constexpr std::array kKnown = {
 
 std::string faultOfPreference(std::string_view domain, std::string_view key,
                               const plist::Value& value) {
-  const auto* const known = std::find_if(
-      kKnown.begin(), kKnown.end(),
-      [&](const KnownPreference& entry) { return entry.domain == domain && entry.key == key; });
+  const auto* const known =
+      std::find_if(kKnown.begin(), kKnown.end(), [&](const KnownPreference& entry) {
+        return entry.domain == domain && (entry.key.empty() || entry.key == key);
+      });
   if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
   const bool isLong = value.dictionary() || value.array() || value.data();
   // No example whose copy would give the permission.

@@ -49,39 +49,45 @@ void failAbsent(ToolContext& context, const Arguments& arguments) {
              arguments.key, arguments.domain, arguments.domain));
 }
 
-// A first day belongs to the permission that 'tavrelctl allow' gave: it goes with that. The switch
-// alone then counts at once.
-void forgetFirstDay(ToolContext& context, const plist::Value& value) {
-  Preferences& preferences = context.preferences();
-  const SubmissionPermission former = submissionPermission(preferences);
-  const bool isGiven = value.boolean().value_or(false);
-  if (isGiven == former.isGiven && isGiven) return;
-  preferences.ZTXPreferencesSetValue(kSubmissionFirstDayKey, {}, kDiagnosticsDomain);
-  context.note(isGiven
-                   ? "this counts at once, also for what is recorded already: 'tavrelctl allow' "
-                     "begins with the next day"
-                   : "logs that wait stay until the next run: 'tavrelctl deny' deletes them");
+// What to say of a change of the permission that 'tavrelctl prefs' makes; empty for other changes.
+std::string permissionNote(const Arguments& arguments, const SubmissionPermission& former,
+                           const SubmissionPermission& now) {
+  if (arguments.domain != kDiagnosticsDomain) return {};
+  if (arguments.key == kSubmissionEnabledKey && (!now.isGiven || !former.isGiven)) {
+    return now.isGiven
+               ? "this counts at once, also for what is recorded already: 'tavrelctl allow' "
+                 "begins with the next day"
+               : "logs that wait stay until the next run: 'tavrelctl deny' deletes them";
+  }
+  const bool isEarlier =
+      former.isGiven && former.firstDay && now.covers(std::int64_t{*former.firstDay} - 1);
+  if (arguments.key == kSubmissionFirstDayKey && isEarlier) {
+    return "what was recorded earlier may leave now, too: 'tavrelctl deny', then 'tavrelctl "
+           "allow', "
+           "begins with the next day";
+  }
+  return {};
 }
 
 // Stores a value, null to remove the key. When that cannot be done, a note has said why.
-void store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
+bool store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
   Preferences& preferences = context.preferences();
-  if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionEnabledKey) {
-    forgetFirstDay(context, value);
-  }
-  const bool wasGiven = submissionPermission(preferences).isGiven;
-  const auto before = preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain).number();
-  if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionFirstDayKey &&
-      wasGiven && before && (!value.number() || value.number()->int64() < before->int64())) {
-    context.note(
-        "what was recorded earlier may leave now, too: 'tavrelctl deny', then 'tavrelctl allow', "
-        "begins with the next day");
-  }
+  const SubmissionPermission former = submissionPermission(preferences);
   preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
+  // A first day belongs to the permission that 'tavrelctl allow' gave: it goes with that. The
+  // switch alone then counts at once.
+  if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionEnabledKey &&
+      !(former.isGiven && value.boolean().value_or(false))) {
+    preferences.ZTXPreferencesSetValue(kSubmissionFirstDayKey, {}, kDiagnosticsDomain);
+  }
   if (!preferences.ZTXPreferencesSynchronize(arguments.domain) ||
       preferences.ZTXPreferencesGetValue(arguments.key, arguments.domain) != value) {
     context.setExitStatus(kExitFailure);
+    return false;
   }
+  const std::string note = permissionNote(arguments, former, submissionPermission(preferences));
+  if (!note.empty()) context.note(note);
+  return true;
 }
 
 void get(ToolContext& context, const Arguments& arguments) {
@@ -132,9 +138,10 @@ void set(ToolContext& context, const Arguments& arguments) {
   if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
   const std::string fault = faultOfPreference(arguments.domain, arguments.key, *value);
   if (!fault.empty() && !arguments.force) return context.failUsage(fault);
-  noteTextThatReadsOtherwise(context, arguments);
   // As it will be read back: for example, dates lose their fraction.
-  store(context, arguments, *plist::readXml(asBytes(*xml)));
+  if (store(context, arguments, *plist::readXml(asBytes(*xml)))) {
+    noteTextThatReadsOtherwise(context, arguments);
+  }
 }
 
 void remove(ToolContext& context, const Arguments& arguments) {
