@@ -91,6 +91,14 @@ TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
     EXPECT_EQ(tidy().failures,
               Lines{path + ": " + fault + ": nothing is removed until it is repaired"});
   }
+  EXPECT_EQ(contentOf(root.path(kTidyFailuresFile)),
+            path + ": it is not a dictionary: nothing is removed until it is repaired\n");
+  std::filesystem::remove(path);
+  std::filesystem::create_symlink("nowhere", path);
+  EXPECT_EQ(tidy().failures,
+            Lines{path + ": it is a link that leads nowhere: nothing is removed until "
+                         "it is repaired"});
+  std::filesystem::remove(path);
   limit(plist::Dictionary::create());
   ASSERT_EQ(chmod(path.c_str(), 0666), 0);
   EXPECT_EQ(tidy().failures,

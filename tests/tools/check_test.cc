@@ -1,5 +1,6 @@
 // tavrelctl status --check
 #include <chrono>
+#include <grp.h>
 #include <unistd.h>
 
 #include "base/iso_date.h"
@@ -107,7 +108,10 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   expect("WARNING permission: DiagnosticSubmissionEnabled is a string, which counts as no", 1);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
   expect("OK permission: the daily log may leave the device\n", 1);
-  expect("WARNING last-log: the next run: no log for day", 1);  // without a whitelist
+  for (const char* junk : {"", "<plist>"}) {  // no whitelist, and none that can be used
+    if (*junk != 0) device.write(kWhitelistFile, junk);
+    expect("WARNING last-log: the next run: no log for day", 1);
+  }
   device.run({"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionFirstDay", "--int",
               std::to_string(today() + 1)});
   expect("OK permission: the daily log may leave the device, from day", 0);
@@ -131,7 +135,10 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
             std::string::npos);
   device.write("/etc/tavrel/limits.plist", "garbage");
-  EXPECT_NE(device.run("status --check").out.find("limits.plist"), std::string::npos);
+  expect("WARNING limits: none since yesterday; " + device.path("/etc/tavrel/limits.plist"), 1);
+  std::filesystem::remove(device.path("/etc/tavrel/limits.plist"));
+  device.write("/var/lib/tavrel/tidy-failures", "no room\nnor time\n");
+  expect("WARNING limits: none since yesterday; 'tavrelctl tidy' failed 0 s ago: no room\n", 1);
   std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);
   std::filesystem::remove(device.path(store + "-wal"));
@@ -180,6 +187,23 @@ TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
   expect("OK lost-values: none since yesterday\n", 1);
   device.run("stat import -", "scalar\ttoday\tcom.norvane.brimhold.dropped\t9\n");
   expect("WARNING lost-values: since yesterday: dropped 9\n", 1);
+}
+
+TEST_F(CheckTest, JudgesNothingThatThisUserCannotSee) {
+  writeRun(kHour, true);
+  device.run("stat import -", "scalar\ttoday\tcom.norvane.tavrel.limits.store.days\t3\n");
+  std::filesystem::create_directories(device.path("/run/tavrel/stat"));
+  std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
+  if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
+  EXPECT_EQ(inChild([this] {
+              if (setgroups(0, nullptr) + setgid(65534) + setuid(65534) != 0) return 100;
+              const std::string out = device.run("status --check").out;
+              int unknown = 0;
+              for (const char* name : {"store", "limits", "lost-values"})
+                unknown += out.find(std::string("UNKNOWN ") + name + ": ") != out.npos ? 1 : 0;
+              return unknown;
+            }),
+            3);
 }
 
 TEST_F(CheckTest, ShowsTheVerdictOfEachDisk) {

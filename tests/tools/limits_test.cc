@@ -28,19 +28,21 @@ TEST(Limits, ShowsAndEnforcesThem) {
   device.check("tidy", prints("nothing to remove\n"));
   device.check("tidy --quiet", prints(""));
   fillStore(device, 92);
+  device.run("stat import", format("scalar\t%lld\tk\t1\n", kToday + 5));
   device.fileLog("outbox/log-tallied-20260101T000000Z-00000001", "L", "{}");
   device.fileLog("outbox/log-tallied-20260102T000000Z-00000001", "L", "{}");
   device.write("/etc/tavrel/limits.plist", xmlOf(R"({"Outbox": {"Days": 1}})"));
   const auto before = device.json("limits")["limits"];
-  EXPECT_EQ(before[0]["days"], 92);
+  EXPECT_EQ(before[0]["days"], 93);
   EXPECT_EQ(before[0]["days_limit"], 90);
   EXPECT_EQ(before[2], R"({"name": "Outbox", "days": 2, "days_limit": 1, "bytes": 16384,
                            "bytes_limit": 4194304, "items": 2})"_json);
   const auto dated = [](std::int64_t day) {
     return std::to_string(day) + " (" + dateText(civilFromDays(day)) + ")";
   };
-  device.check("tidy", prints("statistics store: 2 days removed, " + dated(kToday - 91) + " to " +
-                              dated(kToday - 90) + "\nlogs in the outbox: 1 log removed\n"));
+  device.check("tidy", prints("statistics store: 3 days removed, " + dated(kToday - 91) + " to " +
+                              dated(kToday - 90) + ", " + dated(kToday + 5) +
+                              "\nlogs in the outbox: 1 log removed\n"));
   EXPECT_EQ(device.json("limits")["limits"][2]["items"], 1);
   device.write("/etc/tavrel/limits.plist", xmlOf(R"({"Outbox": 1})"));
   const std::string fault = device.path("/etc/tavrel/limits.plist") +

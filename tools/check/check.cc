@@ -1,5 +1,6 @@
 #include "tools/check/check.h"
 
+#include <algorithm>
 #include <exception>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -41,6 +42,15 @@ std::int64_t secondsOf(plist::Date date) {
 
 std::int64_t CheckScene::ageOf(plist::Date date) const {
   return ageOf(secondsOf(date));
+}
+
+void addFinding(Check& check, CheckState state, std::string_view text) {
+  check.state = graver(check.state, state);
+  if (!check.text.empty()) check.text += "; ";
+  const std::size_t added = check.text.size();
+  check.text += text;
+  std::replace(check.text.begin() + static_cast<std::ptrdiff_t>(added), check.text.end(), '\n',
+               ' ');
 }
 
 std::vector<Check> checkDevice(ToolContext& context, std::chrono::milliseconds examination) {

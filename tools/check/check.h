@@ -42,8 +42,8 @@ struct Check {
 
 /// Ages beyond which something that should happen each day has not happened, in seconds. Every
 /// check of an age has these two thresholds.
-inline constexpr std::int64_t kWarningAge = 2 * 86'400;
-inline constexpr std::int64_t kCriticalAge = 7 * 86'400;
+inline constexpr std::int64_t kWarningAge = std::int64_t{2} * 86'400;
+inline constexpr std::int64_t kCriticalAge = std::int64_t{7} * 86'400;
 
 CheckState stateOfAge(std::int64_t seconds);
 

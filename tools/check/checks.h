@@ -2,6 +2,7 @@
 #pragma once
 
 #include <optional>
+#include <string_view>
 #include <vector>
 
 #include "base/plist.h"
@@ -22,6 +23,9 @@ struct CheckScene {
 };
 
 std::int64_t secondsOf(plist::Date date);
+
+/// Makes a check at least as grave as `state`, and adds to its text, which stays on one line.
+void addFinding(Check& check, CheckState state, std::string_view text);
 
 void checkPermission(CheckScene& scene);
 void checkClock(CheckScene& scene);

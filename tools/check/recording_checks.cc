@@ -1,4 +1,6 @@
 // What programs record: limits that were reached, values that were lost, and folds.
+#include <algorithm>
+#include <cerrno>
 #include <ctime>
 #include <string>
 #include <unistd.h>
@@ -7,7 +9,9 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/folding/fold_notes.h"
+#include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_folder.h"
+#include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/check/checks.h"
 #include "tools/shared/table.h"
@@ -38,7 +42,9 @@ struct Counter {
       text += format("%s%s %lld", text.empty() ? "" : ", ", key.substr(prefix.size()), value);
   }
 
-  Check check(std::string_view name, const CheckFigureKind& kind) const {
+  /// `gap`: why some of it may not have been seen; empty when all was.
+  Check check(std::string_view name, const CheckFigureKind& kind, const std::string& gap) const {
+    if (sum == 0 && !gap.empty()) return {name, "", CheckState::Unknown, gap};
     return {name,
             "",
             sum > 0 ? CheckState::Warning : CheckState::Ok,
@@ -47,27 +53,69 @@ struct Counter {
   }
 };
 
-void checkCounters(CheckScene& scene) {
+Recorders recordersOf(CheckScene& scene) {
+  LinuxPlatform& device = scene.context.linuxPlatform();
+  return Recorders::read(scene.context.root(), device.fileSystem(), device.platform().propertyLists,
+                         device.platform().log);
+}
+
+constexpr const char* kClosedSegments = "segments of other users cannot be read: run as root";
+
+bool hasClosedSegments(const SegmentFolder::Listing& listing) {
+  const auto user = geteuid();
+  return user != 0 && std::ranges::any_of(listing.segments, [user](const SegmentEntry& entry) {
+           return entry.owner != user;
+         });
+}
+
+bool isClosed(const std::string& path) {
+  return access(path.c_str(), R_OK) != 0 && errno == EACCES;
+}
+
+// Why the limits may not be kept: a fault of their file, or what the last tidy could not do.
+void judgeTidying(CheckScene& scene, Check& check) {
+  LinuxPlatform& device = scene.context.linuxPlatform();
+  const auto limits =
+      DeviceLimits::read(device.root(), device.fileSystem(), device.platform().propertyLists);
+  if (!limits) {
+    const bool mayRead = !isClosed(device.root().path(kLimitsPath));
+    return addFinding(check, mayRead ? CheckState::Warning : CheckState::Unknown,
+                      limits.error().message);
+  }
+  const std::string path = device.root().path(kTidyFailuresFile);
+  const auto failures = device.fileSystem().readIfPresent(path, limits::kSystemFactBytes);
+  const auto status = FileSystem::status(path);
+  if (!failures || !*failures || !status) return;
+  addFinding(
+      check, CheckState::Warning,
+      format("'tavrelctl tidy' failed %s ago: %s", ageText(scene.ageOf(status->st_mtim.tv_sec)),
+             std::string_view(**failures).substr(0, (*failures)->find('\n'))));
+}
+
+void checkCounters(CheckScene& scene, const Expected<std::optional<SegmentFolder>>& folder) {
   Counter reached{"com.norvane.tavrel.limits.", {}};
   Counter lost{"com.norvane.brimhold.", {}};
-  auto history = openRecorded(scene.context, {.key = "com.norvane.",
-                                              .firstDay = previousDay(scene.today),
-                                              .lastDay = scene.today,
-                                              .hasValues = false});
+  auto history = RecordedHistory::open(scene.context.root(), scene.context.storeForReading(),
+                                       recordersOf(scene),
+                                       {.key = "com.norvane.",
+                                        .firstDay = previousDay(scene.today),
+                                        .lastDay = scene.today,
+                                        .hasValues = false});
   const Status read = history ? history->walkScalars([&](std::string_view key, std::int32_t,
                                                          std::int64_t value, bool&) {
     reached.add(key, value);
     lost.add(key, value);
   })
                               : Status(history.error());
-  if (!read) {
-    const std::string& message = read.error().message;
-    scene.checks.push_back({"limits", "", CheckState::Unknown, message});
-    scene.checks.push_back({"lost-values", "", CheckState::Unknown, message});
-    return;
+  std::string gap = read ? history->warning().value_or("") : read.error().message;
+  if (gap.empty() && folder && *folder) {
+    const auto listing = (*folder)->list();
+    if (listing && hasClosedSegments(*listing)) gap = kClosedSegments;
   }
-  scene.checks.push_back(reached.check("limits", kReached));
-  scene.checks.push_back(lost.check("lost-values", kLost));
+  Check limits = reached.check("limits", kReached, gap);
+  judgeTidying(scene, limits);
+  scene.checks.push_back(std::move(limits));
+  scene.checks.push_back(lost.check("lost-values", kLost, gap));
 }
 
 // Since a fold last took values. Everything that waits is gone at the next start of the system, so
@@ -81,7 +129,6 @@ std::int64_t longestWait(const CheckScene& scene) {
 
 Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
   Check check{"folding"};
-  LinuxPlatform& device = scene.context.linuxPlatform();
   const auto listing = folder.list();
   if (!listing) {
     check.state = CheckState::Unknown;
@@ -90,20 +137,15 @@ Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
   }
   const auto segments = listing->segments.size();
   check.figures.push_back({&kSegments, static_cast<double>(segments)});
-  const auto user = geteuid();
-  for (const SegmentEntry& entry : listing->segments) {
-    if (user == 0 || entry.owner == user) continue;
+  if (hasClosedSegments(*listing)) {
     check.state = CheckState::Unknown;
-    check.text = "segments of other users cannot be read: run as root";
+    check.text = kClosedSegments;
     return check;
   }
-  const Recorders recorders =
-      Recorders::read(scene.context.root(), device.fileSystem(), device.platform().propertyLists,
-                      device.platform().log);
   const auto history = scene.context.storeForReading().openHistory();
   const auto waiting =
       history ? WaitingValues::read(
-                    folder, recorders, history->get(),
+                    folder, recordersOf(scene), history->get(),
                     {.key = "", .firstDay = kFirstDay, .lastDay = kLastDay, .hasValues = false})
               : Expected<WaitingValues>(history.error());
   if (!waiting) {
@@ -133,8 +175,8 @@ Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
 }  // namespace
 
 void checkRecording(CheckScene& scene) {
-  checkCounters(scene);
   const auto folder = SegmentFolder::open(scene.context.root());
+  checkCounters(scene, folder);
   if (!folder) {
     // Another user than root may not look.
     const bool isClosed = access(scene.context.root().path("/run/tavrel/stat").c_str(), R_OK) != 0;

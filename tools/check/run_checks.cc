@@ -35,16 +35,18 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
   }
   check.figures.push_back({&kRunErrors, static_cast<double>(run.errorCount)});
   const std::string age = ageText(scene.ageOf(run.began));
-  const std::string day =
-      run.day ? " of day " + dayText(lowInt32(*run.day)) : std::string(" of no day");
+  // A run of today's tasks is forced, too; the day tells it from one of yesterday's.
+  std::string what = run.task == "service" ? "the service's run"
+                     : run.task == "daily" ? "the daily run"
+                                           : "the forced run";
+  what += run.day ? " of day " + dayText(lowInt32(*run.day)) : ", which began no day's tasks,";
   if (run.isFinished) {
-    check.text = format("the %s run%s finished, begun %s ago", run.task, day, age);
+    check.text = format("%s finished, begun %s ago", what, age);
   } else if (run.process.isRunning()) {
-    check.text = format("the %s run%s has been running for %s", run.task, day, age);
+    check.text = format("%s has been running for %s", what, age);
     if (scene.ageOf(run.began) >= kLongRun) check.state = graver(check.state, CheckState::Warning);
   } else {
-    check.text =
-        format("the %s run%s, begun %s ago, was killed before its end", run.task, day, age);
+    check.text = format("%s, begun %s ago, was killed before its end", what, age);
     check.state = graver(check.state, CheckState::Warning);
   }
   if (run.lastFinished && (!run.isFinished || !run.day)) {

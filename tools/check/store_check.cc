@@ -1,6 +1,7 @@
 // The statistics store: whether it can be read, is sound, and has room.
 #include <algorithm>
 #include <cerrno>
+#include <cmath>
 #include <filesystem>
 #include <sys/statvfs.h>
 #include <unistd.h>
@@ -30,11 +31,6 @@ constexpr double kLittleSpace = 4 << 20;
 // What the store may take beyond its limit: its log, which is emptied at 1 MiB and more.
 constexpr double kBeyondLimit = 4 << 20;
 
-void add(Check& check, CheckState state, const std::string& text) {
-  check.state = graver(check.state, state);
-  check.text += (check.text.empty() ? "" : "; ") + text;
-}
-
 void checkSize(CheckScene& scene, const std::string& path, Check& check) {
   double size = 0;
   for (const char* ending : {"", "-wal"}) {
@@ -42,23 +38,22 @@ void checkSize(CheckScene& scene, const std::string& path, Check& check) {
     if (status) size += static_cast<double>(status->st_size);
   }
   check.figures.push_back({&kSize, size});
-  add(check, CheckState::Ok, sizeText(size));
+  addFinding(check, CheckState::Ok, sizeText(size));
   LinuxPlatform& device = scene.context.linuxPlatform();
   const auto limits = DeviceLimits::read(scene.context.root(), device.fileSystem(),
                                          device.platform().propertyLists);
-  if (!limits) {
-    add(check, CheckState::Warning, limits.error().message);
-  } else if (const auto limit = static_cast<double>(limits->of(Kept::Store).bytes);
-             size > limit + kBeyondLimit) {
-    add(check, CheckState::Warning, "more than the limit of " + sizeText(limit));
+  // A fault of the limits has a line of its own.
+  const double limit = limits ? static_cast<double>(limits->of(Kept::Store).bytes) : HUGE_VAL;
+  if (size > limit + kBeyondLimit) {
+    addFinding(check, CheckState::Warning, "more than the limit of " + sizeText(limit));
   }
   struct statvfs space {};
   if (statvfs(path.c_str(), &space) != 0) return;
   const double free = static_cast<double>(space.f_bavail) * static_cast<double>(space.f_frsize);
   check.figures.push_back({&kFree, free});
   if (free < kLittleSpace) {
-    add(check, CheckState::Critical,
-        "only " + sizeText(free) + " are free: free some space in its file system");
+    addFinding(check, CheckState::Critical,
+               "only " + sizeText(free) + " are free: free some space in its file system");
   }
 }
 
@@ -68,13 +63,14 @@ void examine(CheckScene& scene, const std::string& path, Check& check) {
                              : Expected<SqliteHistory::Examination>(history.error());
   if (!found) {
     const bool mayRead = access(path.c_str(), R_OK) == 0;
-    return add(check, mayRead ? CheckState::Critical : CheckState::Unknown, found.error().message);
+    return addFinding(check, mayRead ? CheckState::Critical : CheckState::Unknown,
+                      found.error().message);
   }
   if (!found->fault.empty()) {
-    return add(check, CheckState::Critical, "damaged: " + found->fault);
+    return addFinding(check, CheckState::Critical, "damaged: " + found->fault);
   }
-  add(check, CheckState::Ok,
-      found->isWhole ? "no damage" : "no damage in the part that there was time for");
+  addFinding(check, CheckState::Ok,
+             found->isWhole ? "no damage" : "no damage in the part that there was time for");
 }
 
 // Files beside the store that somebody should look at.
@@ -89,12 +85,12 @@ void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
   });
   check.figures.push_back({&kSetAside, static_cast<double>(damaged)});
   if (damaged > 0) {
-    add(check, CheckState::Warning,
-        counted(static_cast<std::uint64_t>(damaged), "damaged store") + " set aside in " +
-            file.parent_path().string());
+    addFinding(check, CheckState::Warning,
+               counted(static_cast<std::uint64_t>(damaged), "damaged store") + " set aside in " +
+                   file.parent_path().string());
   }
   if (FileSystem::status(path + "-kept")) {
-    add(check, CheckState::Warning, "values wait in " + path + "-kept for a commit");
+    addFinding(check, CheckState::Warning, "values wait in " + path + "-kept for a commit");
   }
 }
 
@@ -107,9 +103,9 @@ void checkStore(CheckScene& scene) {
     checkSize(scene, path, check);
     examine(scene, path, check);
   } else if (errno == ENOENT || errno == ENOTDIR) {
-    add(check, CheckState::Ok, "none yet");
+    addFinding(check, CheckState::Ok, "none yet");
   } else {
-    add(check, CheckState::Unknown, path + " cannot be looked at: run as root");
+    addFinding(check, CheckState::Unknown, path + " cannot be looked at: run as root");
   }
   checkCompanions(scene, path, check);
   scene.checks.push_back(std::move(check));

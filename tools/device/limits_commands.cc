@@ -1,5 +1,6 @@
 #include "tools/device/limits_commands.h"
 
+#include <algorithm>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -55,15 +56,26 @@ void showLimits(ToolContext& context) {
   table.print(context.page());
 }
 
+// Days in the order of the calendar, those that follow each other as one: "3 (…) to 5 (…), 9 (…)".
+std::string daysText(std::vector<std::int32_t> days) {
+  std::ranges::sort(days);
+  std::string text;
+  for (auto first = days.begin(); first != days.end();) {
+    auto last = first;
+    while (last + 1 != days.end() && std::int64_t{*(last + 1)} - *last == 1)
+      ++last;
+    text += format("%s%s", text.empty() ? "" : ", ", dayText(*first));
+    if (last != first) text += format(" to %s", dayText(*last));
+    first = last + 1;
+  }
+  return text;
+}
+
 std::string removalText(const TidiedKind& tidied) {
   const auto removed = static_cast<std::uint64_t>(tidied.removed);
   std::string text =
       format("%s: %s removed", tidied.kind->label, counted(removed, tidied.kind->item));
-  if (!tidied.days.empty()) {
-    text += format(", %s", dayText(tidied.days.front()));
-    if (tidied.days.size() > 1) text += format(" to %s", dayText(tidied.days.back()));
-  }
-  return text;
+  return tidied.days.empty() ? text : text + ", " + daysText(tidied.days);
 }
 
 void tidy(ToolContext& context, bool isQuiet) {

@@ -38,20 +38,28 @@ bool isRegular(FiledLog& log) {
   return !log.status || S_ISREG(log.status->st_mode);
 }
 
-// The logs of all folders, as their file names describe them.
-Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context) {
+// The logs of all folders, as their file names describe them. `unseen` gets the reason why withheld
+// ones cannot be seen; where it is null, a line tells that.
+Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
+                                            std::optional<Error>* unseen = nullptr) {
   using enum FileSubmission::Place;
   std::vector<FiledLog> logs;
+  std::optional<Error> closed;
   for (const auto place : {Withheld, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
     // Other users who look at logs do without those that only root may see.
     if (!found && place == Withheld) {
-      context.note(found.error().message);
+      closed = found.error();
       continue;
     }
     if (!found) return found.error();
     for (FileSubmission::FiledLog& log : *found)
       logs.push_back({std::move(log), std::nullopt});
+  }
+  if (unseen != nullptr) {
+    *unseen = std::move(closed);
+  } else if (closed) {
+    context.note(closed->message);
   }
   return logs;
 }
@@ -83,9 +91,10 @@ std::string fileNameOf(const FiledLog& log) {
 }
 
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
-  auto files = filesOfLogs(context);
+  std::optional<Error> unseen;
+  auto files = filesOfLogs(context, &unseen);
   if (!files) return files.error();
-  FiledLogs filed{*std::move(files), 0};
+  FiledLogs filed{*std::move(files), 0, std::move(unseen)};
   if (filed.logs.size() > most) {
     // By the place of each, as a log is costly to move.
     std::vector<std::pair<double, std::size_t>> seconds;
@@ -98,7 +107,8 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
     newest.reserve(most);
     for (auto place = seconds.begin(); place != end; ++place)
       newest.push_back(std::move(filed.logs[place->second]));
-    filed = {std::move(newest), filed.logs.size() - most};
+    filed.older = filed.logs.size() - most;
+    filed.logs = std::move(newest);
   }
   readFacts(context, filed.logs);
   return filed;
@@ -169,6 +179,8 @@ void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs
   const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
   std::string reason = value ? path + ": it is empty or no dictionary" : value.error().message;
   if (bytes && !value) reason = path + ": " + reason;
+  // What is there and cannot be read is a failure; what is missing may be the rest of a kill.
+  if (!bytes && FileSystem::status(path)) context.setExitStatus(kExitFailure);
   context.note(format(
       "%s without metadata: %s",
       counted(static_cast<std::uint64_t>(std::count_if(logs.begin(), logs.end(), isBare)), "log"),

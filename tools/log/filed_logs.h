@@ -25,12 +25,13 @@ std::string_view nameOf(FileSubmission::Place place);
 std::string fileNameOf(const FiledLog& log);
 
 struct FiledLogs {
-  std::vector<FiledLog> logs;  // oldest first
-  std::size_t older = 0;       // that were left out
+  std::vector<FiledLog> logs;        // oldest first
+  std::size_t older = 0;             // that were left out
+  std::optional<Error> unseen = {};  // why those that are withheld cannot be seen
 };
 
 /// The newest logs of all folders, at most so many, chosen by the names of their files: only the
-/// metadata of those is read. A line says so when those that are withheld cannot be seen.
+/// metadata of those is read.
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
 
 /// The logs of all folders whose names begin so, oldest first.
@@ -44,7 +45,7 @@ Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_vi
 /// The filed log that `name` means: its path, or the name of its file with or without the ending.
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);
 
-/// Says once why logs stand without metadata.
+/// Says once why logs stand without metadata. It is a failure when that cannot be read.
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs);
 
 }  // namespace tavrel

@@ -4,6 +4,7 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/limits.h"
 #include "config/bh_config.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
@@ -27,6 +28,16 @@ Json LogConclusion::json() const {
           {"outcome", outcome ? Json(nameOf(*outcome)) : Json(nullptr)}};
 }
 
+namespace {
+
+// As the daemon reads it; it logs what is wrong with it.
+bool hasUsableWhitelist(Platform& platform) {
+  const auto bytes = platform.files->read(kWhitelistPath, limits::kWhitelistBytes);
+  return bytes && platform.propertyLists->decode(asBytes(*bytes));
+}
+
+}  // namespace
+
 LogConclusion concludeOnLogs(ToolContext& context) {
   Platform& platform = context.platform();
   Preferences& preferences = platform.preferences;
@@ -39,7 +50,7 @@ LogConclusion concludeOnLogs(ToolContext& context) {
   conclusion.permission = submissionPermission(preferences);
   if (!conclusion.permission.covers(next)) {
     conclusion.outcome = LogOutcome::NotPermitted;
-  } else if (!platform.files->size(kWhitelistPath)) {
+  } else if (!hasUsableWhitelist(platform)) {
     conclusion.outcome = LogOutcome::NoWhitelist;
   }
   conclusion.isOfNextRun = conclusion.outcome.has_value();

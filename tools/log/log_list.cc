@@ -93,6 +93,7 @@ void listLogs(ToolContext& context, std::size_t most) {
   if (filed->older > 0 && !context.json()) {
     context.out() << counted(filed->older, "older log") << " not shown: see --all\n";
   }
+  if (filed->unseen) return context.fail(filed->unseen->message);
   noteMissingMetadata(context, filed->logs);
 }
 

@@ -11,7 +11,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kLimitsPath = "/etc/tavrel/limits.plist";
 constexpr std::string_view kDaysKey = "Days";
 constexpr std::string_view kBytesKey = "Bytes";
 
@@ -66,7 +65,11 @@ Expected<DeviceLimits> DeviceLimits::read(const DeviceRoot& root, FileSystem& fi
   };
   const auto bytes = files.readIfPresent(path, limits::kSystemFactBytes);
   if (!bytes) return Error{bytes.error().message + ": nothing is removed"};
-  if (!*bytes) return limits;
+  if (!*bytes) {
+    struct stat link {};
+    if (lstat(path.c_str(), &link) == 0) return refuse("it is a link that leads nowhere");
+    return limits;
+  }
   const auto status = FileSystem::status(path);
   if (!status || (status->st_uid != 0 && status->st_uid != geteuid()) ||
       (status->st_mode & (S_IWGRP | S_IWOTH)) != 0) {

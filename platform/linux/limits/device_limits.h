@@ -18,6 +18,8 @@
 
 namespace tavrel {
 
+inline constexpr std::string_view kLimitsPath = "/etc/tavrel/limits.plist";
+
 /// What takes storage. The values are places in `kKeptKinds`.
 enum class Kept : std::uint8_t {
   Store,

@@ -102,9 +102,10 @@ Status KeptFiles::listLogs() {
     const auto status = FileSystem::status(path);
     if (!status || !S_ISREG(status->st_mode)) continue;
     const auto known = parseLogFileName(stem);
-    KeptFile& log = list_.emplace_back(
-        path, folder_ + '/' + stem, known ? known->seconds : std::int64_t{status->st_mtim.tv_sec},
-        blocksOf(*status));
+    list_.push_back({path, folder_ + '/' + stem,
+                     known ? known->seconds : std::int64_t{status->st_mtim.tv_sec},
+                     blocksOf(*status)});
+    KeptFile& log = list_.back();
     log.companion += kLogMetadataEnding;
     if (const auto metadata = FileSystem::status(log.companion)) log.bytes += blocksOf(*metadata);
   }

@@ -23,20 +23,22 @@ std::int64_t reserveOf(std::int64_t bytesInUse, std::int64_t days, const Bounds&
 
 TidyReport Tidy::run() {
   TidyReport report;
+  trim(report);
+  remember(report);
+  return report;
+}
+
+void Tidy::trim(TidyReport& report) {
   const auto limits = DeviceLimits::read(root_, files_, propertyLists_);
-  if (!limits) {
-    report.failures.push_back(limits.error().message);
-    return report;
-  }
+  if (!limits) return report.failures.push_back(limits.error().message);
   // The root always exists, and locking it takes no room.
   const auto lock = files_.lockFolder(root_.path("/"));
-  if (!lock) {
-    report.failures.push_back(lock.error().message);
-    return report;
-  }
+  if (!lock) return report.failures.push_back(lock.error().message);
   const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
   for (const KeptKind& kind : kKeptKinds) {
-    TidiedKind& tidied = report.kinds.emplace_back(&kind, limits->of(kind.kind));
+    TidiedKind& tidied = report.kinds.emplace_back();
+    tidied.kind = &kind;
+    tidied.bounds = limits->of(kind.kind);
     if (kind.kind == Kept::Store) continue;
     auto files = KeptFiles::list(kind.kind, root_, files_, store_.BHDaysSince1970());
     if (!files) {
@@ -50,7 +52,16 @@ TidyReport Tidy::run() {
   TidiedKind& store = report.kinds[static_cast<std::size_t>(Kept::Store)];
   trimStore(store.bounds, store, report.failures);
   count(report, report.failures);
-  return report;
+}
+
+// Where nothing can be written, the caller's own lines remain.
+void Tidy::remember(const TidyReport& report) {
+  const std::string path = root_.path(kTidyFailuresFile);
+  std::string lines;
+  for (const std::string& failure : report.failures)
+    lines += failure + '\n';
+  if (lines.empty()) return files_.discard(path);
+  static_cast<void>(files_.replace(path, asBytes(lines), 0644));
 }
 
 // Days that were recorded while the clock was ahead, then the oldest. Without the days that wait to
@@ -67,7 +78,8 @@ std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& da
     const bool waits = day == today - 1 || (hasRun && day <= lastRun + 2);
     return !waits;
   });
-  std::ranges::stable_partition(order, [&](std::int32_t day) { return isAhead(day, today); });
+  std::stable_partition(order.begin(), order.end(),
+                        [&](std::int32_t day) { return isAhead(day, today); });
   return order;
 }
 

@@ -6,6 +6,7 @@
 
 #include <cstdint>
 #include <string>
+#include <string_view>
 #include <vector>
 
 #include "platform/clock.h"
@@ -19,8 +20,11 @@
 
 namespace tavrel {
 
+/// A line for each thing that the last tidy could not do; missing when there was nothing.
+inline constexpr std::string_view kTidyFailuresFile = "/var/lib/tavrel/tidy-failures";
+
 struct TidiedKind {
-  const KeptKind* kind;
+  const KeptKind* kind = nullptr;
   Bounds bounds;
   std::int64_t removed = 0;        // items
   std::vector<std::int32_t> days;  // of the store, those that went
@@ -50,13 +54,16 @@ class Tidy {
         preferences_(preferences),
         store_(store) {}
 
-  /// Removes what exceeds the limits. While another process does so, waits for it.
+  /// Removes what exceeds the limits. While another process does so, waits for it. What fails is
+  /// left in `kTidyFailuresFile`.
   TidyReport run();
 
   /// What is held, beside its bounds. Changes nothing.
   Expected<std::vector<MeasuredKind>> measure();
 
  private:
+  void trim(TidyReport& report);
+  void remember(const TidyReport& report);
   void trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::string>& failures);
   std::vector<std::int32_t> removalOrder(const std::vector<std::int32_t>& days);
   Expected<KeptUse> measureStore();
