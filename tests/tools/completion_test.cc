@@ -113,7 +113,9 @@ TEST(CompletionTest, CompletesValues) {
       {"log show log", {"log-tallied-20261127T180218Z-5f0c9a1e"}},
       {"log show " + device.path("/folder/f"), {device.path("/folder/file.log")}},
       {"--root " + device.path("/fol"), {device.path("/folder")}},
-      {"--root " + device.path("/folder") + " stat show com", {}},
+      {"--root = " + device.path("/fol"), {device.path("/folder")}},
+      {"--root = " + device.path("/folder") + " stat show com", {}},
+      {"plist convert --to =", {"xml", "binary", "json"}},
       {"log preview --day t", {"today"}}};
   for (const auto& [line, words] : kCases)
     EXPECT_EQ(completeInBash(device, line), words) << line;

@@ -67,10 +67,10 @@ C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s f
 TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   const TemporaryDevice device;
   const std::string path = device.path(kWhitelistFile);
-  device.check("whitelist check", fails("cannot read " + path + ": No such file or directory"));
+  device.check("whitelist check", fails("cannot read " + path + ": No such file or directory", 2));
   device.write(kWhitelistFile, "<plist><dict>");
   device.check("whitelist check",
-               fails(path + ": XML property list, line 1, column 14: no element found"));
+               fails(path + ": XML property list, line 1, column 14: no element found", 2));
   EXPECT_EQ(device.run("whitelist check -", xmlOf("[]")),
             (Outcome{1,
                      "standard input: is an array: a whitelist is a dictionary of groups: nothing "

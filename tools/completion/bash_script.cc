@@ -26,7 +26,8 @@ _tavrelctl_complete() {
 }
 
 _tavrelctl() {
-  local cur=${COMP_WORDS[COMP_CWORD]} path='' given=0 wanted='' word i
+  # Of --option=value, bash makes three words.
+  local cur=${COMP_WORDS[COMP_CWORD]#=} path='' given=0 wanted='' word i
   local -a root=() commands options arguments
   local -A values
   local repeats=0
@@ -34,6 +35,7 @@ _tavrelctl() {
   _tavrelctl_of ''
   for ((i = 1; i < COMP_CWORD; i++)); do
     word=${COMP_WORDS[i]}
+    [[ $word == = ]] && continue
     if [[ -n $wanted ]]; then
       [[ $wanted == --root ]] && root=(--root "$word")
       wanted=''

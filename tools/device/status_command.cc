@@ -30,6 +30,7 @@ struct DeviceStatus {
   std::optional<std::int64_t> storeBytes;  // with its write-ahead log; nothing without a store
   Expected<std::optional<SqliteHistory::DaySpan>> days = std::optional<SqliteHistory::DaySpan>();
   Expected<std::size_t> pending = 0;
+  Expected<std::size_t> outbox = 0;
   Expected<std::size_t> withheld = 0;
   LogConclusion conclusion;
 };
@@ -68,6 +69,7 @@ DeviceStatus takeStatus(ToolContext& context) {
     }
   }
   status.pending = device.submission().count(FileSubmission::Place::Pending);
+  status.outbox = device.submission().count(FileSubmission::Place::Outbox);
   status.withheld = device.submission().count(FileSubmission::Place::Withheld);
   if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
@@ -97,6 +99,7 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
        {"store", std::move(store)},
        {"pending_logs", status.pending ? Json(*status.pending) : Json(nullptr)},
+       {"outbox_logs", status.outbox ? Json(*status.outbox) : Json(nullptr)},
        {"withheld_logs", status.withheld ? Json(*status.withheld) : Json(nullptr)},
        {"conclusion", status.isStateReadable ? status.conclusion.json() : Json(nullptr)}});
 }
@@ -127,6 +130,7 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   table.add({"Store", storeText(status)});
   table.add({"Store file", status.storePath});
   table.add({"Pending logs", status.pending ? std::to_string(*status.pending) : "unreadable"});
+  table.add({"Outbox logs", status.outbox ? std::to_string(*status.outbox) : "unreadable"});
   if (!status.withheld) {
     table.add({"Withheld logs", "unreadable: only root may see them"});
   } else if (*status.withheld > 0) {
@@ -156,7 +160,8 @@ void addStatusCommand(Command app, ToolContext& context) {
     }
     if (context.hasComplaints()) context.setExitStatus(kExitFailure);
     if (!status.days) context.fail(status.days.error().message);
-    if (!status.pending) context.fail(status.pending.error().message);
+    if (!status.pending || !status.outbox)
+      context.fail((status.pending ? status.outbox : status.pending).error().message);
   });
 }
 

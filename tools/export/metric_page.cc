@@ -92,8 +92,8 @@ std::string labelValue(std::string_view bytes) {
   return value;
 }
 
-void MetricPage::add(const MetricFamily& family, std::string_view type, std::string labels,
-                     std::string lines) {
+void MetricPage::add(const MetricFamily& family, std::string_view type, std::string&& labels,
+                     std::string&& lines) {
   Family& added =
       families_.try_emplace(family.name, Family{type, family.unit, family.help, {}}).first->second;
   if (added.metrics.size() >= kMetrics ||

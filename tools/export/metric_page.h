@@ -70,8 +70,8 @@ class MetricPage {
     std::string_view type, unit, help;
     std::map<std::string, std::string> metrics;  // from labels to lines
   };
-  void add(const MetricFamily& family, std::string_view type, std::string labels,
-           std::string lines);
+  void add(const MetricFamily& family, std::string_view type, std::string&& labels,
+           std::string&& lines);
 
   std::map<std::string, Family> families_;
   std::uint64_t leftOut_ = 0;

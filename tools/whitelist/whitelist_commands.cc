@@ -46,9 +46,10 @@ Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file)
   return Whitelist{name, *std::move(bytes), *std::move(value)};
 }
 
+// As below, 1 is what the command looks for, and 2 that it could not look.
 void check(ToolContext& context, const Arguments& arguments) {
   const auto whitelist = readWhitelist(context, arguments.file);
-  if (!whitelist) return context.fail(whitelist.error().message);
+  if (!whitelist) return context.failUsage(whitelist.error().message);
   auto findings = checkWhitelist(whitelist->value);
   std::ranges::move(checkAgainstData(context, whitelist->value), std::back_inserter(findings));
   if (!findings.empty()) context.setExitStatus(kExitFailure);
