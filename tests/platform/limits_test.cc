@@ -99,11 +99,17 @@ TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
             Lines{path + ": it is a link that leads nowhere: nothing is removed until "
                          "it is repaired"});
   std::filesystem::remove(path);
-  limit(plist::Dictionary::create());
-  ASSERT_EQ(chmod(path.c_str(), 0666), 0);
-  EXPECT_EQ(tidy().failures,
-            Lines{path + ": others than root may write it; make root its owner, with mode 0644: "
-                         "nothing is removed until it is repaired"});
+  limit({{"Store", plist::Dictionary{{"Days", 36'500}}}});
+  EXPECT_EQ(tidy().failures, Lines{});
+  EXPECT_FALSE(std::filesystem::exists(root.path(kTidyFailuresFile)));
+  for (const auto& [owner, mode] :
+       {std::pair(geteuid(), 0620), {geteuid(), 0602}, {65534U, 0600}}) {
+    if (chown(path.c_str(), owner, getegid()) != 0) continue;  // not root
+    ASSERT_EQ(chmod(path.c_str(), static_cast<mode_t>(mode)), 0);
+    EXPECT_EQ(tidy().failures,
+              Lines{path + ": others than root may write it; make root its owner, with mode 0644: "
+                           "nothing is removed until it is repaired"});
+  }
   EXPECT_EQ(daysHeld().size(), 201U);
 }
 
@@ -130,7 +136,7 @@ TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
        {kToday - 2, kToday - 1, kToday}},
       {"tomorrow counts as today's neighbour",
        kToday,
-       kToday - 1,
+       kToday - 2,
        {kToday - 1, kToday, kToday + 1, kToday - 7},
        range(kToday - 1, kToday + 1)},
       {"a clock that jumps ahead costs one day a day",
@@ -139,10 +145,10 @@ TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
        {kToday - 2, kToday - 1, kToday, kToday + 3650},
        {kToday - 1, kToday, kToday + 3650}},
       {"a clock in 1970 keeps the day that the next run would have reported",
-       0,
-       kToday - 2,
-       {0, kToday - 3, kToday - 2, kToday - 1},
-       {0, kToday - 2, kToday - 1}},
+       5,
+       kToday - 3,
+       {2, 5, kToday - 2, kToday - 1},
+       {5, kToday - 2, kToday - 1}},
       {"nothing is due", kToday, std::nullopt, {kToday - 3000, kToday}, {kToday - 3000, kToday}}};
   for (const Case& each : kCases) {
     std::filesystem::remove_all(root.path("/var/mobile/Library/Brimhold"));
@@ -253,8 +259,9 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
 
   // The newest log stays, however small the limit; days count as bytes do.
   fileLog("log-tallied-20261127T000009Z-00000005", 400'000);
+  fileLog("StorageStatus-20261126T000009Z-00000006", 1);
   limit({{"Pending", plist::Dictionary{{"Days", 1}}}});
-  EXPECT_EQ(tidy().kinds[1].removed, 1);
+  EXPECT_EQ(tidy().kinds[1].removed, 2);
   limit({{"Pending", small}});
   EXPECT_EQ(tidy().kinds[1].removed, 1);
   EXPECT_EQ(files.list(root.path(kPending))->size(), 3U);

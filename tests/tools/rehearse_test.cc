@@ -36,10 +36,10 @@ struct Rehearsed : TemporaryDevice {
     write("/etc/machine-id", "0123456789abcdef0123456789abcdef\n");
     write("/sys/firmware/devicetree/base/model", "Board\n");
     write("/var/lib/dpkg/status", "Package: a\nStatus: install ok installed\nArchitecture: all\n");
-    const char* const records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/172-";
+    const std::string records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/172-";
     for (int day = 1; day <= 31; ++day)
-      write(format("%s2026-01-%02d.jsonl", records, day), "");
-    write(format("%s1999-01-01.jsonl", records), "");
+      write(records + format("2026-01-%02d.jsonl", day), "");
+    write(records + "1999-01-01.jsonl", "");
     run("stat set app.starts 5");
     run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
     today = json("status")["today"];
