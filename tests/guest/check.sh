@@ -42,19 +42,22 @@ clock() {
   settle
 }
 
-# Until nothing of tavrel is on its way: twice, because one unit starts another.
+services="tavrel-folders.service tavrel-collect.service tavrel-fold.service tavrel-health.service
+  tavrel-daily.service tavrel-upload.service"
+
+# Whether a service of tavrel is at work or about to be. An upload that waits for its next attempt is
+# neither.
+busy() {
+  # shellcheck disable=SC2086
+  systemctl show -P Job -P SubState $services | grep -qvE '^(|dead|failed|auto-restart)$'
+}
+
+# Until nothing of tavrel is on its way. After work it looks twice, because one unit starts another.
 settle() {
-  quiet=0
-  while [ "$quiet" -lt 2 ]; do
-    sleep 0.2
-    if systemctl list-jobs --no-legend | grep -q tavrel ||
-      systemctl --quiet is-active tavrel-upload.service ||
-      systemctl list-units --no-legend --plain --state=activating,deactivating 'tavrel*' |
-      grep -qv auto-restart; then
-      quiet=0
-    else
-      quiet=$((quiet + 1))
-    fi
+  sleep 0.3
+  while busy; do
+    while busy; do sleep 0.2; done
+    sleep 0.3
   done
 }
 

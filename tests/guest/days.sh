@@ -1,6 +1,6 @@
 # Three days by the clock: what is recorded on one leaves the device on the next.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
-mkdir -p '/Library/Application Support/Brimhold' /etc/tavrel
+mkdir -p '/Library/Application Support/Brimhold'
 cp "$here/whitelist.plist" '/Library/Application Support/Brimhold/Whitelist_Pellio.plist'
 
 useradd --no-create-home --groups brimhold recorder

@@ -3,7 +3,7 @@
 # After the day on which the programs were built, which they take for the earliest possible.
 clock '2037-11-20 22:40'
 server=/etc/tavrel-server
-mkdir -p "$server" /srv/tavrel/.unfinished /etc/credstore
+mkdir -p "$server" /srv/tavrel/.unfinished /etc/credstore /etc/tavrel
 chown www-data: /srv/tavrel /srv/tavrel/.unfinished
 certificate() { # NAME SUBJECT [ARGUMENT...]
   name=$1 subject=$2
