@@ -27,7 +27,7 @@ systemctl stop tavrel-collect.timer
 clock '2037-11-22 00:00'
 echo "minutes and hours of a day"
 writes=$(written) used=$(processor)
-for hour in 00 01 02 03 04 05 06 07 08 09 10 11 12 13 14 15 16 17 18 19 20 21 22 23; do
+for hour in $hours; do
   clock "2037-11-22 $hour:07"
   for sample in $samples; do
     systemctl start tavrel-collect.service
@@ -52,12 +52,17 @@ clock '2037-11-23 01:07'
 clock '2037-11-24 00:01'
 expect "the next day's log, too" "log-tallied
 log-tallied" "$(received)"
-expect "samples of the measured day" "$((24 * $(echo "$samples" | wc -w)))" \
+expect "samples of the measured day" "$(($(echo "$hours" | wc -w) * $(echo "$samples" | wc -w)))" \
   "$(tavrelctl stat show com.norvane.usage.samples --json | python3 -c '
 import json, sys
 days = json.load(sys.stdin)["scalar"]["days"]
 print(*[day["value"] for day in days if day["date"] == "2037-11-22"])')"
 systemctl start tavrel-collect.timer
 expect "no unit failed" "" "$(systemctl list-units --no-legend --plain --state=failed 'tavrel*')"
-note "CPU time of the day: $((day_used / 1000)) ms at an instruction a nanosecond"
-note "written in the day: $day_writes bytes"
+if [ "$extent" = whole ]; then
+  most "CPU time of a day in ms, at an instruction a nanosecond" 5000 "$((day_used / 1000))"
+  most "bytes written in a day" 3000000 "$day_writes"
+else
+  note "CPU time of these hours: $((day_used / 1000)) ms at an instruction a nanosecond"
+  note "written in these hours: $day_writes bytes"
+fi

@@ -1,28 +1,36 @@
-# Every unit with its folders missing, read-only, full, and owned by others. A unit that cannot work
-# fails with a status and a line; none is ended by a signal or hangs.
+# Every unit with its folders missing, on a read-only system, with folders that are read-only, of
+# others, and full. A unit that cannot work fails with a status and a line; none is ended by a signal
+# or hangs.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
-folders="/var/mobile /var/lib/tavrel /run/tavrel"
+kept="/var/mobile /var/lib/tavrel"
+folders="$kept /run/tavrel"
 
+# What each unit's start came to, and its lines from warnings up.
 outcomes() {
+  systemctl reset-failed 'tavrel-*.service'
   for unit in collect fold daily health upload; do
-    systemctl reset-failed "tavrel-$unit.service" 2>/dev/null
-    systemctl start "tavrel-$unit.service" 2>/dev/null
-    settle
-    echo "$unit $(outcome "tavrel-$unit.service")"
+    systemctl restart "tavrel-$unit.service" 2>/dev/null
+    while busy; do sleep 0.1; done
+    echo "$unit: $(outcome "tavrel-$unit.service")"
+    journalctl --quiet --sync
+    invocation=$(systemctl show -P InvocationID "tavrel-$unit.service")
+    journalctl --quiet -o cat -p warning "_SYSTEMD_INVOCATION_ID=$invocation" | sed 's/^/  /'
   done
 }
 
-all_work="collect success 0
-fold success 0
-daily success 0
-health success 0
-upload success 0"
+all_work="collect: success 0
+fold: success 0
+daily: success 0
+health: success 0
+upload: success 0"
 
-cover() { # OPTIONS OF TMPFS
-  for folder in $folders; do mount -t tmpfs -o "$1" none "$folder"; done
+cover() { # OPTIONS OF TMPFS, FOLDER...
+  options=$1
+  shift
+  for folder in "$@"; do mount -t tmpfs -o "$options" none "$folder"; done
 }
 uncover() {
-  for folder in $folders; do umount "$folder"; done
+  for folder in "$@"; do umount "$folder"; done
 }
 
 systemctl stop tavrel-fold.path tavrel-upload.path tavrel-collect.timer
@@ -32,20 +40,36 @@ for folder in $folders; do mv "$folder" "$folder.kept"; done
 expect "units without their folders" "$all_work" "$(outcomes)"
 for folder in $folders; do rm -rf "$folder" && mv "$folder.kept" "$folder"; done
 
-cover ro
-expect "units with read-only folders" "$all_work" "$(outcomes)"
-uncover
+# What a read-only system needs is writable. The journal keeps its files in /run meanwhile.
+journalctl --relinquish-var
+cover mode=755 /var /tmp
+mount -o remount,bind,ro /
+expect "the system is read-only" 1 "$(touch /etc/tavrel/file 2>/dev/null; echo $?)"
+expect "units on a read-only system with an empty /var" "$all_work" "$(outcomes)"
+expect "the folders that they made" "755 root root /var/lib/tavrel
+755 root root /var/mobile" "$(stat -c '%a %U %G %n' /var/lib/tavrel /var/mobile)"
+mount -o remount,bind,rw /
+uncover /var /tmp
+journalctl --flush
 
-cover "uid=65534,gid=65534,mode=700"
-expect "units with the folders of others" "$all_work" "$(outcomes)"
-uncover
+# shellcheck disable=SC2086
+cover ro $kept
+expect "units with read-only folders" "ro" "$(outcomes)"
+# shellcheck disable=SC2086
+uncover $kept
 
-cover "size=64k"
-for folder in $folders; do
-  mkdir -p "$folder/Library"
-  cat /dev/zero >"$folder/full" 2>/dev/null
-done
-expect "units with full folders" "$all_work" "$(outcomes)"
-uncover
+# shellcheck disable=SC2086
+cover "uid=65534,gid=65534,mode=700" $folders
+expect "units with the folders of others" "others" "$(outcomes)"
+# shellcheck disable=SC2086
+uncover $folders
+
+# shellcheck disable=SC2086
+cover "size=64k" $folders
+for folder in $folders; do cat /dev/zero >"$folder/full" 2>/dev/null; done
+expect "units with full folders" "full" "$(outcomes)"
+# shellcheck disable=SC2086
+uncover $folders
+
 expect "units with their folders again" "$all_work" "$(outcomes)"
 systemctl start tavrel-fold.path tavrel-upload.path tavrel-collect.timer

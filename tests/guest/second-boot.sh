@@ -1,8 +1,12 @@
 #!/bin/sh
 # The start after the pulled plug.
+#   second-boot.sh whole|short
 set -u
 here=$(dirname "$0")
-for part in check truth faults removal; do
+extent=$1
+parts="truth faults removal"
+[ "$extent" = whole ] || parts="truth removal"
+for part in check $parts; do
   # shellcheck source=/dev/null
   . "$here/$part.sh"
 done

@@ -1,4 +1,4 @@
-# A client of the service, an upgrade with data, and a run in whose middle the plug is pulled.
+# A client of the service, and an upgrade with data, which is cut off and completed.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 socket=/run/tavrel/com.norvane.tallied.tavrel.socket
 expect "the service sleeps" inactive "$(systemctl is-active tavrel.service)"
@@ -7,11 +7,23 @@ expect "a client starts it" active "$(systemctl is-active tavrel.service)"
 expect "other users are refused" 1 "$(setpriv --reuid recorder --clear-groups \
   tavrelctl send force yesterday >/dev/null 2>&1; echo $?)"
 
-before=$(tavrelctl stat export | sort | sha256sum)
+exported() { tavrelctl stat export | grep -F com.example. | sort; }
+before=$(exported)
+if [ "$extent" = whole ]; then
+  # The second package is being unpacked, the first is not configured.
+  dpkg --unpack "$later"/*.deb >/root/dpkg.log 2>&1 &
+  dpkg=$!
+  until grep -q '^Unpacking tavrel:* ' /root/dpkg.log; do :; done
+  kill -KILL "$dpkg"
+  wait "$dpkg" 2>/dev/null
+  dpkg --configure -a >>/root/dpkg.log 2>&1
+fi
 apt-get install -qq -y --no-install-recommends "$later"/*.deb >>/root/apt.log 2>&1
 expect "the packages are upgraded" 0 "$?"
-expect "their version" "$later_version" "$(dpkg-query -W -f '${Version}' tavrel)"
-expect "an upgrade keeps the statistics" "$before" "$(tavrelctl stat export | sort | sha256sum)"
+expect "their version" "$later_version" "$(dpkg-query -W -f '${Version}\n' tavrel tavrel-statsd \
+  tavrel-upload libbrimhold1 python3-brimhold | sort -u)"
+expect "all is configured" "" "$(dpkg --audit)"
+expect "an upgrade keeps the statistics" "$before" "$(exported)"
 expect "the timers run on" 5 "$(systemctl list-units --no-legend --plain --state=active \
   'tavrel-*.timer' | wc -l)"
 expect "the service's socket" socket "$(stat -c %F $socket)"
