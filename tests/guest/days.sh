@@ -42,7 +42,7 @@ expect "what the server has of it" "starts 20
 seconds [2.0, 6.0, 4.0, 8.0, 2]
 seconds {'(-inf, 5]': 1, '(5, inf)': 1}" "$(zcat /srv/tavrel/device-7/*.log.gz | python3 -c '
 import plistlib, sys
-log = plistlib.load(sys.stdin.buffer)
+log = plistlib.loads(sys.stdin.buffer.read())
 print("starts", log["BHScalars"]["com.example.starts"])
 print("seconds", log["BHDistributions"]["com.example.seconds"])
 print("seconds", log["BHDistributionsHistogram"]["com.example.seconds"])')"

@@ -4,6 +4,7 @@
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 kept="/var/mobile /var/lib/tavrel"
 folders="$kept /run/tavrel"
+store="statistics store /var/mobile/Library/Brimhold/BHDataStore.sqlitedb"
 
 # What each unit's start came to, and its lines from warnings up.
 outcomes() {
@@ -14,7 +15,8 @@ outcomes() {
     echo "$unit: $(outcome "tavrel-$unit.service")"
     journalctl --quiet --sync
     invocation=$(systemctl show -P InvocationID "tavrel-$unit.service")
-    journalctl --quiet -o cat -p warning "_SYSTEMD_INVOCATION_ID=$invocation" | sed 's/^/  /'
+    journalctl --quiet -o cat -p warning "_SYSTEMD_INVOCATION_ID=$invocation" |
+      sed "s/^/  /; s|$store|STORE|; s/ [0-9]* values/ N values/"
   done
 }
 
@@ -33,6 +35,7 @@ uncover() {
   for folder in "$@"; do umount "$folder"; done
 }
 
+nginx
 systemctl stop tavrel-fold.path tavrel-upload.path tavrel-collect.timer
 expect "units with their folders" "$all_work" "$(outcomes)"
 
@@ -54,20 +57,73 @@ journalctl --flush
 
 # shellcheck disable=SC2086
 cover ro $kept
-expect "units with read-only folders" "ro" "$(outcomes)"
+expect "units with read-only folders" "collect: success 0
+fold: exit-code 1
+  tavrelctl: STORE: its folder cannot be made: Read-only file system: mount its file system for \
+writing; what programs recorded waits for the next fold
+daily: success 0
+  this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: Read-only file \
+system; make the file system writable
+  STORE: its folder cannot be made: Read-only file system: mount its file system for writing; what \
+programs recorded waits for the next fold
+  STORE: its folder cannot be made: Read-only file system: mount its file system for writing; \
+N values are not kept yet: its folder cannot be opened: No such file or directory: check owner and \
+permissions of the folder
+  the run's statistics could not be saved: the next run repeats day 24799
+  cannot make the folder /var/mobile/Library: Read-only file system; make the file system writable
+  this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: Read-only file \
+system; make the file system writable
+health: exit-code 1
+  cannot keep counters: cannot make the folder /var/lib/tavrel/health: Read-only file system; make \
+the file system writable
+upload: exit-code 238
+  tavrel-upload.service: Failed to set up special execution directory in /var/lib: Read-only file \
+system
+  tavrel-upload.service: Failed at step STATE_DIRECTORY spawning /usr/sbin/tavrel-upload: Read-only \
+file system" \
+  "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $kept
 
 # shellcheck disable=SC2086
 cover "uid=65534,gid=65534,mode=700" $folders
-expect "units with the folders of others" "others" "$(outcomes)"
+expect "units with the folders of others" "collect: success 0
+fold: success 0
+daily: success 0
+health: exit-code 1
+  cannot use remembered counters /var/lib/tavrel/health/memory.plist, starting again: cannot read \
+/var/lib/tavrel/health/memory.plist: Permission denied; run as root or as the owner of the files
+  cannot keep counters: cannot write /var/lib/tavrel/health/memory.plist: Permission denied; run as \
+root or as the owner of the files
+upload: success 0" \
+  "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders
 
 # shellcheck disable=SC2086
 cover "size=64k" $folders
+for folder in $folders; do mkdir "$folder/Library"; done
 for folder in $folders; do cat /dev/zero >"$folder/full" 2>/dev/null; done
-expect "units with full folders" "full" "$(outcomes)"
+expect "units with full folders" "collect: exit-code 1
+  tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
+'tavrelctl stat fold'
+fold: success 0
+daily: exit-code 0
+  this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \
+device; free some space
+  STORE: database or disk is full: free some space in its file system; N values are not kept yet: \
+cannot write /var/mobile/Library/Brimhold/BHDataStore.sqlitedb-kept: No space left on device; free \
+some space
+  the run's statistics could not be saved: the next run repeats day 24799
+  cannot write /var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist: No space left on \
+device; free some space
+  this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \
+device; free some space
+health: exit-code 1
+  cannot keep counters: cannot write /var/lib/tavrel/health/memory.plist: No space left on device; \
+free some space
+upload: success 0" \
+  "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders
 

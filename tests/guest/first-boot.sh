@@ -1,7 +1,7 @@
 #!/bin/sh
 # The first start of the guest's system, up to a pulled plug.
 #   first-boot.sh whole|short PACKAGES LATER-PACKAGES
-# shellcheck disable=SC2034 # The parts use the variables.
+# shellcheck disable=SC2034,SC2154 # The parts share variables.
 set -u
 here=$(dirname "$0")
 extent=$1 packages=$2 later=$3

@@ -6,6 +6,15 @@ for unit in tavrel.service tavrel-.service; do
   mkdir -p "/run/systemd/system/$unit.d"
   printf '[Service]\nSlice=tavrel.slice\n' >"/run/systemd/system/$unit.d/slice.conf"
 done
+# Samples are asked for without a pause.
+mkdir -p /run/systemd/system/tavrel-collect.service.d
+printf '[Unit]\nStartLimitIntervalSec=0\n' >/run/systemd/system/tavrel-collect.service.d/often.conf
+# A random delay would begin anew with each jump of the clock.
+for timer in daily fold upload; do
+  mkdir -p "/run/systemd/system/tavrel-$timer.timer.d"
+  printf '[Timer]\nRandomizedDelaySec=0\nAccuracySec=1s\n' \
+    >"/run/systemd/system/tavrel-$timer.timer.d/exact.conf"
+done
 systemctl daemon-reload
 systemd-run --quiet --unit=keeps-slice --slice=tavrel.slice sleep infinity
 find / -xdev | sort >/root/before
@@ -23,6 +32,7 @@ tavrel-fold-shutdown.service
 tavrel-fold.path
 tavrel-fold.timer
 tavrel-health.timer
+tavrel-upload-boot.timer
 tavrel-upload.path
 tavrel-upload.timer
 tavrel.socket"
