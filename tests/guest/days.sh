@@ -23,14 +23,22 @@ record 4
 
 # Counted exactly: no sample but these.
 systemctl stop tavrel-collect.timer
-# The day that is measured: a sample for each minute, the folds, the run and the upload.
+starts="1 2 3 4 5 6 7 8 9 10"
+settle
+used=$(processor)
+for start in $starts; do systemctl start tavrel-collect.service; done
+sample_used=$((($(processor) - used) / 10))
+
+# The day that is measured: a sample for each minute, the folds, the run and the upload. The service
+# of a sample takes most of its time to start and nothing of the flash, so samples are taken without
+# it, and its CPU time is that of the starts above.
 clock '2037-11-22 00:00'
 echo "minutes and hours of a day"
 writes=$(written) used=$(processor)
 for hour in $hours; do
   clock "2037-11-22 $hour:07"
   for sample in $samples; do
-    systemctl start tavrel-collect.service
+    tavrelctl stat collect --once >/dev/null
   done
   # As the kernel and the journal do some time after a change.
   journalctl --quiet --sync && sync
@@ -52,17 +60,19 @@ clock '2037-11-23 01:07'
 clock '2037-11-24 00:01'
 expect "the next day's log, too" "log-tallied
 log-tallied" "$(received)"
-expect "samples of the measured day" "$(($(echo "$hours" | wc -w) * $(echo "$samples" | wc -w)))" \
+taken=$(($(echo "$hours" | wc -w) * $(echo "$samples" | wc -w)))
+expect "samples of the measured day" "$taken" \
   "$(tavrelctl stat show com.norvane.usage.samples --json | python3 -c '
 import json, sys
 days = json.load(sys.stdin)["scalar"]["days"]
 print(*[day["value"] for day in days if day["date"] == "2037-11-22"])')"
 systemctl start tavrel-collect.timer
 expect "no unit failed" "" "$(systemctl list-units --no-legend --plain --state=failed 'tavrel*')"
+note "CPU time of a sample: $((sample_used / 1000)) ms at an instruction a nanosecond"
+note "CPU time of the other units: $((day_used / 1000)) ms"
 if [ "$extent" = whole ]; then
-  most "CPU time of a day in ms, at an instruction a nanosecond" 5000 "$((day_used / 1000))"
+  most "CPU time of a day in ms" 5000 "$(((day_used + taken * sample_used) / 1000))"
   most "bytes written in a day" 3000000 "$day_writes"
 else
-  note "CPU time of these hours: $((day_used / 1000)) ms at an instruction a nanosecond"
   note "written in these hours: $day_writes bytes"
 fi
