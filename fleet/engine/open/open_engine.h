@@ -1,0 +1,20 @@
+// Opens the database that a text of the command line names.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string_view>
+
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+
+enum class OpenMode : std::uint8_t {
+  kRead,   ///< the database must be there
+  kWrite,  ///< makes it, or its tables, where they are missing
+};
+
+/// `where` is the path of an SQLite file. Throws EngineError.
+std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,165 @@
+#include "fleet/engine/sqlite/connection.h"
+
+#include <cmath>
+#include <cstring>
+#include <sqlite3.h>
+
+#include "fleet/engine/engine.h"
+#include "fleet/engine/sqlite/real.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr int kBusyMilliseconds = 60'000;
+
+const char* adviceFor(int code) {
+  switch (code & 0xFF) {
+    case SQLITE_BUSY:
+    case SQLITE_LOCKED:
+      return "another program has been writing to it for long; try again when that has ended";
+    case SQLITE_CORRUPT:
+    case SQLITE_NOTADB:
+      return "it is damaged; load the logs into a new file";
+    case SQLITE_FULL:
+      return "free some space in its file system";
+    case SQLITE_CANTOPEN:
+    case SQLITE_READONLY:
+    case SQLITE_PERM:
+    case SQLITE_AUTH:
+      return "check owner and permissions of the file and its folder";
+    case SQLITE_NOMEM:
+      return "load or ask for less at once";
+    default:
+      return "check the file system that holds it";
+  }
+}
+
+}  // namespace
+
+void Connection::Close::operator()(sqlite3* handle) const {
+  sqlite3_close(handle);
+}
+
+Connection::Connection(const std::string& path, bool writes) : path_(path) {
+  sqlite3* handle = nullptr;
+  const int flags = (writes ? SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE : SQLITE_OPEN_READONLY) |
+                    SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
+  const int code = sqlite3_open_v2(path.c_str(), &handle, flags, nullptr);
+  handle_.reset(handle);
+  if (code != SQLITE_OK) fail(code);
+  sqlite3_busy_timeout(handle, kBusyMilliseconds);
+}
+
+void Connection::fail(int code) const {
+  std::string text = path_ + ": " + (handle_ ? sqlite3_errmsg(handle()) : sqlite3_errstr(code));
+  if (const int system = handle_ ? sqlite3_system_errno(handle()) : 0;
+      system != 0 && ((code & 0xFF) == SQLITE_IOERR || (code & 0xFF) == SQLITE_CANTOPEN))
+    text += std::string(" (") + std::strerror(system) + ")";
+  throw EngineError(text + ": " + adviceFor(code));
+}
+
+void Connection::execute(const char* sql) {
+  if (const int code = sqlite3_exec(handle(), sql, nullptr, nullptr, nullptr); code != SQLITE_OK)
+    fail(code);
+}
+
+std::int64_t Connection::integer(const char* sql) {
+  Statement statement(*this, sql);
+  return statement.step() ? statement.integer(0) : 0;
+}
+
+int Connection::changes() const {
+  return sqlite3_changes(handle());
+}
+
+void Statement::Finalize::operator()(sqlite3_stmt* handle) const {
+  sqlite3_finalize(handle);
+}
+
+Statement::Statement(const Connection& connection, std::string_view sql) : connection_(connection) {
+  sqlite3_stmt* handle = nullptr;
+  check(sqlite3_prepare_v3(connection.handle(), sql.data(), static_cast<int>(sql.size()),
+                           SQLITE_PREPARE_PERSISTENT, &handle, nullptr));
+  handle_.reset(handle);
+}
+
+void Statement::check(int code) const {
+  if (code != SQLITE_OK) connection_.fail(code);
+}
+
+void Statement::bind(int index, std::int64_t value) {
+  check(sqlite3_bind_int64(handle_.get(), index, value));
+}
+
+void Statement::bind(int index, double value) {
+  if (std::isnan(value) && !isUsualNan(value))
+    check(sqlite3_bind_blob64(handle_.get(), index, &value, sizeof value, SQLITE_TRANSIENT));
+  else
+    check(sqlite3_bind_double(handle_.get(), index, value));
+}
+
+void Statement::bind(int index, std::string_view text) {
+  check(sqlite3_bind_text64(handle_.get(), index, text.empty() ? "" : text.data(), text.size(),
+                            SQLITE_STATIC, SQLITE_UTF8));
+}
+
+void Statement::bindBlob(int index, std::string_view bytes) {
+  check(sqlite3_bind_blob64(handle_.get(), index, bytes.data(), bytes.size(), SQLITE_STATIC));
+}
+
+bool Statement::step() {
+  const int code = sqlite3_step(handle_.get());
+  if (code == SQLITE_ROW) return true;
+  if (code != SQLITE_DONE) connection_.fail(code);
+  return false;
+}
+
+void Statement::reset() {
+  sqlite3_reset(handle_.get());
+}
+
+void Statement::run() {
+  while (step()) {
+  }
+  reset();
+}
+
+std::int64_t Statement::integer(int column) const {
+  return sqlite3_column_int64(handle_.get(), column);
+}
+
+double Statement::real(int column) const {
+  switch (sqlite3_column_type(handle_.get(), column)) {
+    case SQLITE_NULL:
+      return kUsualNan;
+    case SQLITE_BLOB: {
+      double value = kUsualNan;
+      if (sqlite3_column_bytes(handle_.get(), column) == sizeof value)
+        std::memcpy(&value, sqlite3_column_blob(handle_.get(), column), sizeof value);
+      return value;
+    }
+    default:
+      return sqlite3_column_double(handle_.get(), column);
+  }
+}
+
+std::string_view Statement::text(int column) const {
+  const auto* const bytes = static_cast<const char*>(sqlite3_column_blob(handle_.get(), column));
+  return {bytes == nullptr ? "" : bytes,
+          static_cast<std::size_t>(sqlite3_column_bytes(handle_.get(), column))};
+}
+
+WriteTransaction::WriteTransaction(Connection& connection) : connection_(connection) {
+  connection_.execute("BEGIN IMMEDIATE");
+}
+
+WriteTransaction::~WriteTransaction() {
+  if (open_) sqlite3_exec(connection_.handle(), "ROLLBACK", nullptr, nullptr, nullptr);
+}
+
+void WriteTransaction::commit() {
+  connection_.execute("COMMIT");
+  open_ = false;
+}
+
+}  // namespace tavrel::fleet

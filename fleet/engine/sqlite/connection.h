@@ -1,0 +1,86 @@
+// Ownership of an SQLite connection and its statements. Failures are thrown as EngineError.
+#pragma once
+
+#include <cstdint>
+#include <memory>
+#include <string>
+#include <string_view>
+
+struct sqlite3;
+struct sqlite3_stmt;
+
+namespace tavrel::fleet {
+
+class Connection {
+ public:
+  Connection(const std::string& path, bool writes);
+
+  void execute(const char* sql);
+  /// The first column of the first row.
+  std::int64_t integer(const char* sql);
+  /// The rows that the last statement changed.
+  int changes() const;
+
+  sqlite3* handle() const { return handle_.get(); }
+  const std::string& path() const { return path_; }
+
+  [[noreturn]] void fail(int code) const;
+
+ private:
+  struct Close {
+    void operator()(sqlite3* handle) const;
+  };
+
+  std::string path_;
+  std::unique_ptr<sqlite3, Close> handle_;
+};
+
+/// Must not outlive its connection. Borrows what is bound until the next reset.
+class Statement {
+ public:
+  Statement(const Connection& connection, std::string_view sql);
+
+  void bind(int index, std::int64_t value);
+  void bind(int index, double value);
+  void bind(int index, std::string_view text);
+  void bindBlob(int index, std::string_view bytes);
+
+  /// True with a row, false at the end.
+  bool step();
+  /// Bindings stay.
+  void reset();
+  /// Runs to the end and resets.
+  void run();
+
+  std::int64_t integer(int column) const;
+  double real(int column) const;
+  /// Valid until the next step or reset.
+  std::string_view text(int column) const;
+
+ private:
+  struct Finalize {
+    void operator()(sqlite3_stmt* handle) const;
+  };
+
+  void check(int code) const;
+
+  const Connection& connection_;
+  std::unique_ptr<sqlite3_stmt, Finalize> handle_;
+};
+
+/// A transaction that writes; rolled back unless it is committed.
+class WriteTransaction {
+ public:
+  explicit WriteTransaction(Connection& connection);
+  ~WriteTransaction();
+  WriteTransaction(const WriteTransaction&) = delete;
+  WriteTransaction& operator=(const WriteTransaction&) = delete;
+
+  void commit();
+
+ private:
+  Connection& connection_;
+  bool open_ = true;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,73 @@
+// The numbers that keys, buckets of histograms and applications have in an SQLite file.
+#pragma once
+
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <unordered_map>
+#include <vector>
+
+#include "fleet/engine/engine.h"
+#include "fleet/engine/sqlite/connection.h"
+#include "fleet/model/log_record.h"
+#include "fleet/model/text_arena.h"
+
+namespace tavrel::fleet {
+
+/// From texts to numbers, in memory. Logs mostly have the same texts in the same order, so that
+/// each entry remembers which one was asked for after it.
+class Dictionary {
+ public:
+  std::optional<std::int64_t> find(std::string_view text);
+  void add(std::string_view text, std::int64_t number);
+
+ private:
+  struct Entry {
+    std::string_view text;
+    std::int64_t number = 0;
+    std::size_t follower = 0;
+  };
+
+  std::vector<Entry> entries_;
+  std::unordered_map<std::string_view, std::size_t> places_;
+  TextArena texts_;
+  std::size_t last_ = 0;
+};
+
+/// To be used inside a write transaction, after `refresh`; what a transaction added counts only
+/// when it is committed, so after a rollback a new object has to take over.
+class Names {
+ public:
+  explicit Names(const Connection& connection);
+
+  /// Reads what other loaders have added.
+  void refresh();
+
+  std::int64_t key(KeyKind kind, std::string_view name);
+  std::int64_t bucket(const CellRow& cell);
+  std::int64_t application(const ApplicationRow& application);
+
+ private:
+  // One table of names.
+  struct Table {
+    Table(const Connection& connection, const char* readNew, const char* insert)
+        : news(connection, readNew), addition(connection, insert) {}
+
+    /// The number for the next name of the table.
+    std::int64_t next(const Connection& connection);
+
+    Statement news;  ///< the rows above ?1: id, the texts that a name consists of
+    Statement addition;
+    Dictionary numbers;
+    std::int64_t highest = 0;
+  };
+
+  const Connection& connection_;
+  Table keys_;
+  Table buckets_;
+  Table applications_;
+  std::string text_;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,173 @@
+#include "fleet/engine/sqlite/reading.h"
+
+#include <array>
+
+#include "fleet/engine/sqlite/row_id.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::size_t kRowsAtOnce = 1024;
+
+// Collects rows and hands them out in blocks.
+template <class Row>
+class Batch {
+ public:
+  explicit Batch(const Visitor<Row>& visit) : visit_(visit) {}
+
+  void add(const Row& row) {
+    rows_[count_] = row;
+    if (++count_ == kRowsAtOnce) flush();
+  }
+  void flush() {
+    if (count_ != 0) visit_({rows_.data(), count_});
+    count_ = 0;
+  }
+
+ private:
+  const Visitor<Row>& visit_;
+  std::array<Row, kRowsAtOnce> rows_;
+  std::size_t count_ = 0;
+};
+
+// What one statement after another reads inside is of one moment.
+class ReadTransaction {
+ public:
+  explicit ReadTransaction(Connection& connection) : connection_(connection) {
+    connection.execute("BEGIN");
+  }
+  ~ReadTransaction() {
+    try {
+      connection_.execute("COMMIT");
+    } catch (const EngineError&) {
+      // It has ended by itself.
+    }
+  }
+  ReadTransaction(const ReadTransaction&) = delete;
+  ReadTransaction& operator=(const ReadTransaction&) = delete;
+
+ private:
+  Connection& connection_;
+};
+
+constexpr const char* kLogs =
+    "SELECT id, day, created, os_version, previous_os_version, config_number, whitelist_digest, "
+    "task_id, language, preferred_language, region FROM log WHERE day BETWEEN ?1 AND ?2";
+
+}  // namespace
+
+Reading::Reading(Connection& connection)
+    : connection_(connection),
+      findKey_(connection, "SELECT id FROM key WHERE kind = ?1 AND name = ?2"),
+      newBlocks_(connection, "SELECT id, first_log FROM block WHERE id > ?1 ORDER BY id"),
+      buckets_(connection, "SELECT id, lower, upper FROM bucket WHERE key = ?1"),
+      scalars_(connection, "SELECT id, value FROM scalar WHERE id BETWEEN ?1 AND ?2"),
+      distributions_(connection,
+                     "SELECT id, minimum, maximum, mean, squared_deviations, count "
+                     "FROM distribution WHERE id BETWEEN ?1 AND ?2"),
+      cells_(connection, "SELECT id, count FROM cell WHERE id BETWEEN ?1 AND ?2") {}
+
+void Reading::logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) {
+  Statement statement(connection_, kLogs);
+  statement.bind(1, std::int64_t{firstDay});
+  statement.bind(2, std::int64_t{lastDay});
+  while (statement.step()) {
+    LogRow row;
+    row.log = static_cast<LogId>(statement.integer(0));
+    row.day = static_cast<std::int32_t>(statement.integer(1));
+    row.created = statement.integer(2);
+    row.osVersion = statement.text(3);
+    row.previousOsVersion = statement.text(4);
+    row.configNumber = statement.text(5);
+    row.whitelistDigest = statement.text(6);
+    row.taskID = statement.text(7);
+    row.language = statement.text(8);
+    row.preferredLanguage = statement.text(9);
+    row.region = statement.text(10);
+    visit({&row, 1});
+  }
+}
+
+std::vector<Key> Reading::keys() {
+  std::vector<Key> keys;
+  Statement statement(connection_, "SELECT kind, name FROM key ORDER BY kind, name");
+  while (statement.step())
+    keys.push_back({std::string(statement.text(1)), static_cast<KeyKind>(statement.integer(0))});
+  return keys;
+}
+
+std::int64_t Reading::find(KeyKind kind, std::string_view key) {
+  findKey_.reset();
+  findKey_.bind(1, static_cast<std::int64_t>(kind));
+  findKey_.bind(2, key);
+  const std::int64_t id = findKey_.step() ? findKey_.integer(0) : 0;
+  findKey_.reset();
+  return id;
+}
+
+void Reading::refreshBlocks() {
+  newBlocks_.reset();
+  newBlocks_.bind(1, blocks_.empty() ? 0 : blocks_.back().id);
+  while (newBlocks_.step())
+    blocks_.push_back({newBlocks_.integer(0), newBlocks_.integer(1)});
+  newBlocks_.reset();
+}
+
+template <class Row, class Make>
+void Reading::visitRows(Statement& statement, std::int64_t name, const Visitor<Row>& visit,
+                        const Make& make) {
+  Batch<Row> batch(visit);
+  for (const Block& block : blocks_) {
+    const std::int64_t first = firstRowId(block.id, name);
+    statement.reset();
+    statement.bind(1, first);
+    statement.bind(2, first + kLogsInBlock - 1);
+    while (statement.step()) {
+      const std::int64_t log = block.firstLog + placeOf(statement.integer(0));
+      batch.add(make(statement, static_cast<LogId>(log)));
+    }
+  }
+  statement.reset();
+  batch.flush();
+}
+
+void Reading::scalars(std::string_view key, const Visitor<ScalarValue>& visit) {
+  const ReadTransaction transaction(connection_);
+  const std::int64_t id = find(KeyKind::kScalar, key);
+  if (id == 0) return;
+  refreshBlocks();
+  visitRows(scalars_, id, visit, [](const Statement& row, LogId log) {
+    return ScalarValue{log, row.integer(1)};
+  });
+}
+
+void Reading::distributions(std::string_view key, const Visitor<DistributionValue>& visit) {
+  const ReadTransaction transaction(connection_);
+  const std::int64_t id = find(KeyKind::kDistribution, key);
+  if (id == 0) return;
+  refreshBlocks();
+  visitRows(distributions_, id, visit, [](const Statement& row, LogId log) {
+    return DistributionValue{log,
+                             {row.real(1), row.real(2), row.real(3), row.real(4),
+                              static_cast<std::uint64_t>(row.integer(5))}};
+  });
+}
+
+void Reading::cells(std::string_view key, const Visitor<CellValue>& visit) {
+  const ReadTransaction transaction(connection_);
+  const std::int64_t id = find(KeyKind::kHistogram, key);
+  if (id == 0) return;
+  refreshBlocks();
+  buckets_.reset();
+  buckets_.bind(1, id);
+  while (buckets_.step()) {
+    const double lower = buckets_.real(1);
+    const double upper = buckets_.real(2);
+    visitRows(cells_, buckets_.integer(0), visit, [&](const Statement& row, LogId log) {
+      return CellValue{log, lower, upper, static_cast<std::uint64_t>(row.integer(1))};
+    });
+  }
+  buckets_.reset();
+}
+
+}  // namespace tavrel::fleet

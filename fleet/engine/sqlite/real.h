@@ -1,0 +1,20 @@
+// Doubles as SQLite values that come back with the same bits.
+//
+// SQLite has no not-a-number: it stores null in its place. So the usual one, which parsers of
+// numbers yield, is null, and others are blobs of their 8 bytes. Columns of doubles have no
+// declared type, as the conversions of a REAL column lose the sign of zero.
+#pragma once
+
+#include <bit>
+#include <cstdint>
+#include <limits>
+
+namespace tavrel::fleet {
+
+inline constexpr double kUsualNan = std::numeric_limits<double>::quiet_NaN();
+
+inline bool isUsualNan(double value) {
+  return std::bit_cast<std::uint64_t>(value) == std::bit_cast<std::uint64_t>(kUsualNan);
+}
+
+}  // namespace tavrel::fleet

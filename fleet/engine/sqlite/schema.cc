@@ -1,0 +1,135 @@
+#include "fleet/engine/sqlite/schema.h"
+
+#include <array>
+#include <cerrno>
+#include <cstdint>
+#include <cstring>
+#include <fstream>
+#include <string_view>
+
+#include "fleet/engine/engine.h"
+#include "fleet/engine/sqlite/row_id.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::int64_t kApplicationId = 0x7461766C;  // "tavl"
+constexpr std::int64_t kVersion = 1;
+
+static_assert(kPlaceBits == 14 && kNameBits == 25, "the views below compute with these numbers");
+
+// `id` of the four tables of rows: see row_id.h. Columns without a type hold doubles: see real.h.
+constexpr const char* kTables = R"(
+CREATE TABLE log(id INTEGER PRIMARY KEY, digest BLOB NOT NULL UNIQUE, day INTEGER NOT NULL,
+  created INTEGER NOT NULL, os_version TEXT NOT NULL, previous_os_version TEXT NOT NULL,
+  config_number TEXT NOT NULL, whitelist_digest TEXT NOT NULL, task_id TEXT NOT NULL,
+  language TEXT NOT NULL, preferred_language TEXT NOT NULL, region TEXT NOT NULL);
+CREATE TABLE block(id INTEGER PRIMARY KEY, first_log INTEGER NOT NULL);
+
+CREATE TABLE key(id INTEGER PRIMARY KEY, kind INTEGER NOT NULL, name TEXT NOT NULL,
+  UNIQUE(kind, name));
+CREATE TABLE bucket(id INTEGER PRIMARY KEY, key INTEGER NOT NULL REFERENCES key, lower, upper,
+  label TEXT NOT NULL, UNIQUE(key, label));
+CREATE TABLE application(id INTEGER PRIMARY KEY, bundle TEXT NOT NULL, version TEXT NOT NULL,
+  uuid TEXT NOT NULL, orbo_id INTEGER NOT NULL, arch INTEGER NOT NULL,
+  UNIQUE(bundle, version, uuid, orbo_id, arch));
+
+CREATE TABLE scalar(id INTEGER PRIMARY KEY, value INTEGER NOT NULL);
+CREATE TABLE distribution(id INTEGER PRIMARY KEY, minimum, maximum, mean, squared_deviations,
+  count INTEGER NOT NULL);
+CREATE TABLE cell(id INTEGER PRIMARY KEY, count INTEGER NOT NULL);
+CREATE TABLE activation(id INTEGER PRIMARY KEY, times INTEGER NOT NULL);
+
+CREATE VIEW logs AS
+  SELECT id AS log, lower(hex(digest)) AS digest, day, date(day * 86400, 'unixepoch') AS date,
+    created, os_version, previous_os_version, config_number, whitelist_digest, task_id, language,
+    preferred_language, region
+  FROM log;
+CREATE VIEW scalars AS
+  SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, r.value
+  FROM key k CROSS JOIN block b CROSS JOIN scalar r
+    ON r.id BETWEEN b.id << 39 | k.id << 14 AND b.id << 39 | k.id << 14 | 16383
+  WHERE k.kind = 0;
+CREATE VIEW distributions AS
+  SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, r.minimum, r.maximum, r.mean,
+    r.squared_deviations, r.count
+  FROM key k CROSS JOIN block b CROSS JOIN distribution r
+    ON r.id BETWEEN b.id << 39 | k.id << 14 AND b.id << 39 | k.id << 14 | 16383
+  WHERE k.kind = 1;
+CREATE VIEW cells AS
+  SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, u.lower, u.upper, u.label, r.count
+  FROM key k CROSS JOIN bucket u ON u.key = k.id CROSS JOIN block b CROSS JOIN cell r
+    ON r.id BETWEEN b.id << 39 | u.id << 14 AND b.id << 39 | u.id << 14 | 16383
+  WHERE k.kind = 2;
+CREATE VIEW applications AS
+  SELECT a.bundle, a.version, a.uuid, a.orbo_id, a.arch, b.first_log + (r.id & 16383) AS log,
+    r.times
+  FROM application a CROSS JOIN block b CROSS JOIN activation r
+    ON r.id BETWEEN b.id << 39 | a.id << 14 AND b.id << 39 | a.id << 14 | 16383;
+)";
+
+enum class Found { kNothing, kDatabase };
+
+std::uint32_t word(const std::array<unsigned char, 100>& header, std::size_t at) {
+  return std::uint32_t{header[at]} << 24 | std::uint32_t{header[at + 1]} << 16 |
+         std::uint32_t{header[at + 2]} << 8 | header[at + 3];
+}
+
+void checkVersion(const std::string& path, std::int64_t version) {
+  if (version == kVersion) return;
+  throw EngineError(path + ": has tables of version " + std::to_string(version) +
+                    ", and this program knows version " + std::to_string(kVersion) +
+                    ": use the program that made it, or load the logs into a new file");
+}
+
+// Reads the file's header as bytes: SQLite would complete or undo the changes of another program's
+// file while it opens it.
+Found look(const std::string& path) {
+  std::array<unsigned char, 100> header{};
+  errno = 0;
+  std::ifstream file(path, std::ios::binary);
+  if (!file.is_open()) {
+    if (errno == ENOENT) return Found::kNothing;
+    throw EngineError(path + ": " + std::strerror(errno) +
+                      ": check owner and permissions of the file and its folder");
+  }
+  file.read(reinterpret_cast<char*>(header.data()), header.size());
+  if (file.bad() || (file.gcount() == 0 && errno == EISDIR))
+    throw EngineError(path + ": cannot be read: name a file");
+  if (file.gcount() == 0) return Found::kNothing;
+  static constexpr std::string_view kMagic("SQLite format 3\0", 16);
+  if (file.gcount() < 100 || std::memcmp(header.data(), kMagic.data(), kMagic.size()) != 0)
+    throw EngineError(path + ": is not a database: name another file");
+  if (word(header, 68) != kApplicationId)
+    throw EngineError(path + ": is another program's database: name another file");
+  checkVersion(path, word(header, 60));
+  return Found::kDatabase;
+}
+
+// The first transaction goes without a write-ahead log, so that the header is in the file itself.
+void createTables(Connection& connection) {
+  connection.execute("PRAGMA page_size = 8192");
+  WriteTransaction transaction(connection);
+  if (connection.integer("SELECT count(*) FROM sqlite_schema") == 0) {
+    connection.execute(kTables);
+    connection.execute(("PRAGMA application_id = " + std::to_string(kApplicationId)).c_str());
+    connection.execute(("PRAGMA user_version = " + std::to_string(kVersion)).c_str());
+  }
+  transaction.commit();
+}
+
+}  // namespace
+
+Connection openFile(const std::string& path, bool writes) {
+  const Found found = look(path);
+  if (found == Found::kNothing && !writes)
+    throw EngineError(path + ": there is no database: load logs into it first");
+  Connection connection(path, writes);
+  if (found == Found::kNothing) createTables(connection);
+  checkVersion(path, connection.integer("PRAGMA user_version"));
+  if (writes) connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
+  connection.execute("PRAGMA cache_size = -32768; PRAGMA mmap_size = 2147418112");
+  return connection;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,132 @@
+// What every engine has to do, on each of them.
+#include <cmath>
+#include <gmock/gmock.h>
+#include <limits>
+#include <random>
+#include <thread>
+
+#include "fleet/engine/open/open_engine.h"
+#include "tests/fleet/engine_records.h"
+#include "tests/platform/temporary_root.h"
+#include "tests/system/killed_process.h"
+
+namespace tavrel::fleet {
+namespace {
+
+using testing::ElementsAre;
+using testing::UnorderedElementsAreArray;
+
+/// A database that is not there yet.
+class Site {
+ public:
+  std::string where() const { return root_.root.path("/fleet.db"); }
+
+ private:
+  TemporaryRoot root_;
+};
+
+class EngineContract : public testing::Test {
+ protected:
+  std::unique_ptr<Engine> open(OpenMode mode = OpenMode::kWrite) const {
+    return openEngine(site.where(), mode);
+  }
+  Site site;
+};
+
+constexpr double kInfinity = std::numeric_limits<double>::infinity();
+
+LogRecord fullRecord(std::uint64_t number) {
+  LogRecord record = makeRecord(number);
+  const auto value = static_cast<std::int64_t>(number);
+  record.scalars = {{"a", value}, {"b", -value}, {"über\n'\"", INT64_MIN}};
+  record.distributions = {{"a", {1.5, 2.5, 2, 0.25, number}}};
+  record.cells = {{"a", -kInfinity, 1, "(-inf, 1]", number}, {"a", 1, kInfinity, "(1, inf)", 1}};
+  record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
+  return record;
+}
+
+std::vector<LogRecord> fullRecords(std::uint64_t first, std::uint64_t count) {
+  std::vector<LogRecord> records;
+  for (std::uint64_t number = first; number < first + count; ++number)
+    records.push_back(fullRecord(number));
+  return records;
+}
+
+TEST_F(EngineContract, HandsOutWhatWasAppended) {
+  LogRecord record = makeRecord(1, -3);
+  record.previousOsVersion = "before";
+  record.configNumber = "c";
+  record.whitelistDigest = "w";
+  record.taskID = "t";
+  record.language = "de";
+  record.preferredLanguage = "de-AT";
+  record.scalars = {{"s", INT64_MIN}, {"t", INT64_MAX}};
+  record.distributions = {{"s", {-0.0, kInfinity, std::nan(""), -std::nan("7"), UINT64_MAX}},
+                          {"t", {5e-324, 0.0, 1.0, 0.1, 0}}};
+  record.cells = {{"h", -kInfinity, -0.0, "(-inf, 0]", UINT64_MAX},
+                  {"h", 0.1, 1e300, "(0.1, 1e+300]", 0}};
+  EXPECT_EQ(open()->append({&record, 1}).added, 1u);
+
+  const auto engine = open(OpenMode::kRead);
+  std::vector<std::string> keys;
+  for (const Key& key : engine->keys())
+    keys.push_back(std::to_string(static_cast<int>(key.kind)) + key.name);
+  EXPECT_THAT(keys, ElementsAre("0s", "0t", "1s", "1t", "2h"));
+  const std::string name = "1795000001 ";
+  const auto bits = bitsOf;
+  EXPECT_THAT(contentOf(*engine),
+              UnorderedElementsAreArray(
+                  {name + "-3|Pellio 4.2 (16R349)|before|c|w|t|de|de-AT|region 1",
+                   name + "s=-9223372036854775808", name + "t=9223372036854775807",
+                   name + "s:" + bits(-0.0) + "," + bits(kInfinity) + "," + bits(std::nan("")) +
+                       "," + bits(-std::nan("7")) + ",18446744073709551615",
+                   name + "t:" + bits(5e-324) + ",0," + bits(1) + "," + bits(0.1) + ",0",
+                   name + "h(" + bits(-kInfinity) + "," + bits(-0.0) + "]18446744073709551615",
+                   name + "h(" + bits(0.1) + "," + bits(1e300) + "]0"}));
+  int rows = 0;
+  engine->scalars("h", [&](auto) { ++rows; });
+  engine->logs(-2, INT32_MAX, [&](auto) { ++rows; });
+  EXPECT_EQ(rows, 0);
+}
+
+TEST_F(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
+  std::vector<LogRecord> records = fullRecords(0, 700);
+  EXPECT_EQ(open()->append(records).added, 700u);
+  const auto expected = contentOf(*open());
+  EXPECT_EQ(expected.size(), 700u * 7);
+
+  Site other;
+  const auto engine = openEngine(other.where(), OpenMode::kWrite);
+  std::shuffle(records.begin(), records.end(), std::mt19937(5));
+  records.push_back(fullRecord(3));
+  for (const auto& [first, count, known] :
+       {std::array<std::size_t, 3>{0, 1, 0}, {0, 4, 1}, {4, 600, 0}, {500, 201, 105}}) {
+    const auto appended = engine->append(std::span(records).subspan(first, count));
+    EXPECT_EQ(appended.known, known);
+    EXPECT_EQ(appended.added, count - known);
+  }
+  EXPECT_EQ(contentOf(*engine->reader()), expected);
+}
+
+TEST_F(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
+  const std::vector<LogRecord> records = fullRecords(0, 240);
+  std::array<std::size_t, 2> added{};
+  {
+    std::array<std::jthread, 2> loaders;
+    for (std::size_t loader = 0; loader < 2; ++loader) {
+      loaders[loader] = std::jthread([&, loader] {
+        const auto engine = open();
+        for (std::size_t portion = 0; portion < 24; ++portion)
+          added[loader] += engine->append(std::span(records).subspan(portion * 10, 10)).added;
+      });
+    }
+  }
+  EXPECT_GE(added[0] + added[1], 240u);
+  Site other;
+  const auto engine = openEngine(other.where(), OpenMode::kWrite);
+  engine->append(records);
+  EXPECT_EQ(contentOf(*open()), contentOf(*engine));
+}
+
+}  // namespace
+}  // namespace tavrel::fleet

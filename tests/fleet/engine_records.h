@@ -1,0 +1,73 @@
+// Records for tests of engines, and all that an engine hands out as text that can be compared.
+#pragma once
+
+#include <algorithm>
+#include <bit>
+#include <cstring>
+#include <deque>
+#include <map>
+#include <string>
+#include <vector>
+
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+
+inline LogRecord makeRecord(std::uint64_t number, std::int32_t day = 20781) {
+  LogRecord record;
+  std::memcpy(record.digest.data(), &number, sizeof number);
+  record.day = day;
+  record.created = 1'795'000'000 + static_cast<std::int64_t>(number);
+  record.osVersion = "Pellio 4.2 (16R349)";
+  record.region = record.texts.keep("region " + std::to_string(number));
+  return record;
+}
+
+inline std::string bitsOf(double value) {
+  return std::to_string(std::bit_cast<std::uint64_t>(value));
+}
+
+/// Each row of a database, as lines in the order of their text. A log has the name of its creation.
+inline std::vector<std::string> contentOf(Engine& engine) {
+  std::vector<std::string> lines;
+  std::map<LogId, std::string> names;
+  engine.logs(INT32_MIN, INT32_MAX, [&](std::span<const LogRow> rows) {
+    for (const LogRow& row : rows) {
+      const std::string name = std::to_string(row.created);
+      names[row.log] = name;
+      std::string line = name + " " + std::to_string(row.day);
+      for (const std::string_view text :
+           {row.osVersion, row.previousOsVersion, row.configNumber, row.whitelistDigest, row.taskID,
+            row.language, row.preferredLanguage, row.region})
+        line += "|" + std::string(text);
+      lines.push_back(line);
+    }
+  });
+  const auto add = [&](LogId log, const std::string& line) {
+    if (names.contains(log)) lines.push_back(names[log] + " " + line);
+  };
+  for (const Key& key : engine.keys()) {
+    engine.scalars(key.name, [&](std::span<const ScalarValue> rows) {
+      if (key.kind == KeyKind::kScalar)
+        for (const ScalarValue& row : rows)
+          add(row.log, key.name + "=" + std::to_string(row.value));
+    });
+    engine.distributions(key.name, [&](std::span<const DistributionValue> rows) {
+      if (key.kind == KeyKind::kDistribution)
+        for (const auto& [log, five] : rows)
+          add(log, key.name + ":" + bitsOf(five.minimum) + "," + bitsOf(five.maximum) + "," +
+                       bitsOf(five.mean) + "," + bitsOf(five.squaredDeviations) + "," +
+                       std::to_string(five.count));
+    });
+    engine.cells(key.name, [&](std::span<const CellValue> rows) {
+      if (key.kind == KeyKind::kHistogram)
+        for (const auto& [log, lower, upper, count] : rows)
+          add(log,
+              key.name + "(" + bitsOf(lower) + "," + bitsOf(upper) + "]" + std::to_string(count));
+    });
+  }
+  std::sort(lines.begin(), lines.end());
+  return lines;
+}
+
+}  // namespace tavrel::fleet
