@@ -67,7 +67,7 @@ struct Key {
   KeyKind kind = KeyKind::kScalar;
 };
 
-/// Rows come in blocks, in no particular order, each row once.
+/// Rows come in blocks, in no particular order, each row once. What a visitor throws is passed on.
 template <class Row>
 using Visitor = std::function<void(std::span<const Row>)>;
 
@@ -87,10 +87,12 @@ class Engine {
   /// The logs of the days from `firstDay` to `lastDay`, both included.
   virtual void logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) = 0;
 
-  /// All keys that have rows, in the order of kind and name.
+  /// All keys that have rows, in the order of kind and name. A load that was killed may have left
+  /// further ones.
   virtual std::vector<Key> keys() = 0;
 
-  // The rows of one key, of all days. A key without rows has none.
+  // The rows of one key, of all days. A key without rows has none. Rows of logs that `logs` does not
+  // hand out do not count: a load that was killed may have left some.
   virtual void scalars(std::string_view key, const Visitor<ScalarValue>& visit) = 0;
   virtual void distributions(std::string_view key, const Visitor<DistributionValue>& visit) = 0;
   virtual void cells(std::string_view key, const Visitor<CellValue>& visit) = 0;

@@ -6,6 +6,7 @@
 #include <thread>
 
 #include "fleet/engine/open/open_engine.h"
+#include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
 #include "tests/platform/temporary_root.h"
 #include "tests/system/killed_process.h"
@@ -16,22 +17,35 @@ namespace {
 using testing::ElementsAre;
 using testing::UnorderedElementsAreArray;
 
-/// A database that is not there yet.
+// Databases that are not there yet.
 class Site {
  public:
-  std::string where() const { return root_.root.path("/fleet.db"); }
+  explicit Site(bool isServer) {
+    if (isServer) server_.emplace();
+  }
+  std::string where(const std::string& name = "fleet") const {
+    return server_ ? server_->address(name) : root_.root.path("/" + name);
+  }
 
  private:
   TemporaryRoot root_;
+  std::optional<ClickhouseServer> server_;
 };
 
-class EngineContract : public testing::Test {
+class EngineContract : public testing::TestWithParam<bool> {
  protected:
   std::unique_ptr<Engine> open(OpenMode mode = OpenMode::kWrite) const {
     return openEngine(site.where(), mode);
   }
-  Site site;
+  std::unique_ptr<Engine> openOther() const {
+    return openEngine(site.where("other"), OpenMode::kWrite);
+  }
+  Site site{GetParam()};
 };
+
+INSTANTIATE_TEST_SUITE_P(, EngineContract, testing::Bool(), [](const auto& instance) {
+  return instance.param ? "ClickHouse" : "SQLite";
+});
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
 
@@ -52,7 +66,7 @@ std::vector<LogRecord> fullRecords(std::uint64_t first, std::uint64_t count) {
   return records;
 }
 
-TEST_F(EngineContract, HandsOutWhatWasAppended) {
+TEST_P(EngineContract, HandsOutWhatWasAppended) {
   LogRecord record = makeRecord(1, -3);
   record.previousOsVersion = "before";
   record.configNumber = "c";
@@ -89,14 +103,13 @@ TEST_F(EngineContract, HandsOutWhatWasAppended) {
   EXPECT_EQ(rows, 0);
 }
 
-TEST_F(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
+TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   std::vector<LogRecord> records = fullRecords(0, 700);
   EXPECT_EQ(open()->append(records).added, 700u);
   const auto expected = contentOf(*open());
   EXPECT_EQ(expected.size(), 700u * 7);
 
-  Site other;
-  const auto engine = openEngine(other.where(), OpenMode::kWrite);
+  const auto engine = openOther();
   std::shuffle(records.begin(), records.end(), std::mt19937(5));
   records.push_back(fullRecord(3));
   for (const auto& [first, count, known] :
@@ -108,7 +121,7 @@ TEST_F(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   EXPECT_EQ(contentOf(*engine->reader()), expected);
 }
 
-TEST_F(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
+TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
   const std::vector<LogRecord> records = fullRecords(0, 240);
   std::array<std::size_t, 2> added{};
   {
@@ -122,8 +135,7 @@ TEST_F(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
     }
   }
   EXPECT_GE(added[0] + added[1], 240u);
-  Site other;
-  const auto engine = openEngine(other.where(), OpenMode::kWrite);
+  const auto engine = openOther();
   engine->append(records);
   EXPECT_EQ(contentOf(*open()), contentOf(*engine));
 }

@@ -14,7 +14,9 @@ enum class OpenMode : std::uint8_t {
   kWrite,  ///< makes it, or its tables, where they are missing
 };
 
-/// `where` is the path of an SQLite file. Throws EngineError.
+/// `where` is the path of an SQLite file, or the address of a database on a ClickHouse server:
+/// clickhouse://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], clickhouses:// over TLS.
+/// docs/fleet-tables.md has the options. Throws EngineError.
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode);
 
 }  // namespace tavrel::fleet

@@ -1,0 +1,127 @@
+#include "fleet/engine/clickhouse/address.h"
+
+#include <algorithm>
+#include <charconv>
+#include <curl/curl.h>
+#include <fstream>
+#include <iterator>
+#include <memory>
+
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::string_view kPlain = "clickhouse://";
+constexpr std::string_view kEncrypted = "clickhouses://";
+constexpr std::streamsize kLongestPassword = 4096;
+constexpr int kLongestTimeout = 86'400;
+
+[[noreturn]] void refuse(const std::string& what) {
+  throw EngineError("the database's address " + what +
+                    ": write clickhouse://[USER@]HOST[:PORT]/DATABASE[?cluster=NAME]");
+}
+
+struct Free {
+  void operator()(char* text) const { curl_free(text); }
+};
+using CurlText = std::unique_ptr<char, Free>;
+
+std::string part(CURLU* url, CURLUPart which, unsigned flags = CURLU_URLDECODE) {
+  char* text = nullptr;
+  if (curl_url_get(url, which, &text, flags) != CURLUE_OK) return {};
+  return CurlText(text).get();
+}
+
+// Names go into statements as they are.
+void checkName(const std::string& what, std::string_view name) {
+  const auto isPlain = [](char c) {
+    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
+  };
+  if (name.empty() || !std::all_of(name.begin(), name.end(), isPlain))
+    refuse("needs a name of letters, digits and underscores as its " + what);
+}
+
+std::string passwordIn(const std::string& path) {
+  std::ifstream file(path, std::ios::binary);
+  std::string password(kLongestPassword + 1, '\0');
+  file.read(password.data(), kLongestPassword + 1);
+  if (!file.is_open() || file.bad() || file.gcount() > kLongestPassword)
+    throw EngineError(path + ": cannot be read as a password: check that you may read the file");
+  password.resize(static_cast<std::size_t>(file.gcount()));
+  while (!password.empty() && (password.back() == '\n' || password.back() == '\r'))
+    password.pop_back();
+  return password;
+}
+
+std::chrono::seconds secondsIn(std::string_view text) {
+  int seconds = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), seconds);
+  if (error != std::errc() || end != text.data() + text.size() || seconds < 1 ||
+      seconds > kLongestTimeout)
+    refuse("needs a timeout from 1 to " + std::to_string(kLongestTimeout) + " seconds");
+  return std::chrono::seconds(seconds);
+}
+
+std::string decoded(std::string_view text) {
+  int size = 0;
+  const CurlText plain(
+      curl_easy_unescape(nullptr, text.data(), static_cast<int>(text.size()), &size));
+  return plain ? std::string(plain.get(), static_cast<std::size_t>(size)) : std::string();
+}
+
+void readOptions(ServerAddress& address, std::string_view query) {
+  while (!query.empty()) {
+    const std::string_view option = query.substr(0, query.find('&'));
+    query.remove_prefix(std::min(query.size(), option.size() + 1));
+    const std::size_t sign = option.find('=');
+    const std::string_view name = option.substr(0, sign);
+    const std::string value = sign == option.npos ? "" : decoded(option.substr(sign + 1));
+    if (name == "cluster") {
+      checkName("cluster", value);
+      address.cluster = value;
+    } else if (name == "password-file") {
+      address.password = passwordIn(value);
+    } else if (name == "ca-file") {
+      address.authorityFile = value;
+    } else if (name == "timeout") {
+      address.timeout = secondsIn(value);
+    } else {
+      refuse("has the unknown option \"" + std::string(name) + '"');
+    }
+  }
+}
+
+}  // namespace
+
+bool isServerAddress(std::string_view text) {
+  return text.starts_with(kPlain) || text.starts_with(kEncrypted);
+}
+
+ServerAddress parseServerAddress(std::string_view text) {
+  const bool encrypted = text.starts_with(kEncrypted);
+  const std::unique_ptr<CURLU, void (*)(CURLU*)> url(curl_url(), curl_url_cleanup);
+  const std::string whole(text);
+  if (!url ||
+      curl_url_set(url.get(), CURLUPART_URL, whole.c_str(), CURLU_NON_SUPPORT_SCHEME) != CURLUE_OK)
+    refuse("is malformed");
+
+  ServerAddress address;
+  const std::string host = part(url.get(), CURLUPART_HOST, 0);
+  std::string port = part(url.get(), CURLUPART_PORT);
+  if (port.empty()) port = encrypted ? "8443" : "8123";
+  if (host.empty()) refuse("has no host");
+  address.database = part(url.get(), CURLUPART_PATH);
+  if (address.database.starts_with('/')) address.database.erase(0, 1);
+  checkName("database", address.database);
+  address.name =
+      std::string(encrypted ? kEncrypted : kPlain) + host + ":" + port + "/" + address.database;
+  address.url = std::string(encrypted ? "https://" : "http://") + host + ":" + port + "/";
+  address.user = part(url.get(), CURLUPART_USER);
+  address.password = part(url.get(), CURLUPART_PASSWORD);
+  readOptions(address, part(url.get(), CURLUPART_QUERY, 0));
+  if (address.user.empty() && !address.password.empty()) address.user = "default";
+  return address;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,28 @@
+// Where a ClickHouse server is, and how it is spoken to.
+#pragma once
+
+#include <chrono>
+#include <string>
+#include <string_view>
+
+namespace tavrel::fleet {
+
+struct ServerAddress {
+  std::string name;  ///< for messages: scheme, host, port and database, without a password
+  std::string url;   ///< of its HTTP interface, with a slash at the end
+  std::string user;
+  std::string password;
+  std::string authorityFile;  ///< trusted in place of the system's authorities; empty without
+  std::string database;
+  std::string cluster;                ///< empty without
+  std::chrono::seconds timeout{300};  ///< of one request, with its answer
+};
+
+/// Whether the text is meant as the address of a server.
+bool isServerAddress(std::string_view text);
+
+/// clickhouse[s]://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], with the options
+/// "cluster", "password-file", "ca-file" and "timeout" (in seconds). Throws EngineError.
+ServerAddress parseServerAddress(std::string_view text);
+
+}  // namespace tavrel::fleet

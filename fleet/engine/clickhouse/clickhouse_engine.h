@@ -1,0 +1,14 @@
+// An engine that keeps its tables on a ClickHouse server. docs/fleet-tables.md describes them.
+#pragma once
+
+#include <memory>
+#include <string_view>
+
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+
+/// The address as in address.h. Throws EngineError. With `writes`, missing tables are made.
+std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, bool writes);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,142 @@
+#include "fleet/engine/clickhouse/clickhouse_schema.h"
+
+#include <array>
+#include <string>
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::string_view kVersion = "1";
+
+constexpr int kUnknownTable = 60;
+constexpr int kUnknownDatabase = 81;
+
+struct TableForm {
+  const char* name;
+  const char* columns;
+  const char* order;
+  const char* shard;  // all rows of a log are on one shard
+};
+
+// Keys are texts and not numbers: sorted, they take hardly more room, and nobody has to hand out
+// numbers to several loaders.
+constexpr std::array kTables = {
+    TableForm{"log",
+              "log UInt64, digest FixedString(32), day Int32, created Int64, os_version String, "
+              "previous_os_version String, config_number String, whitelist_digest String, "
+              "task_id String, language String, preferred_language String, region String",
+              "digest, log", "log"},
+    TableForm{"key", "kind UInt8, name String", "kind, name", "sipHash64(name)"},
+    TableForm{"scalar", "key String, log UInt64, value Int64", "key, log", "log"},
+    TableForm{"distribution",
+              "key String, log UInt64, minimum Float64, maximum Float64, mean Float64, "
+              "squared_deviations Float64, count UInt64",
+              "key, log", "log"},
+    TableForm{"cell",
+              "key String, log UInt64, lower Float64, upper Float64, label String, count UInt64",
+              "key, log", "log"},
+    TableForm{"activation",
+              "bundle String, log UInt64, version String, uuid String, orbo_id Int64, arch Int64, "
+              "times UInt64",
+              "bundle, log", "log"},
+    TableForm{"tavrel_schema", "version UInt32", "version", "version"},
+};
+
+struct ViewForm {
+  const char* name;
+  const char* columns;
+  const char* table;
+};
+
+constexpr std::array kViews = {
+    ViewForm{"logs",
+             "log, lower(hex(digest)) AS digest, day, toDate(day) AS date, created, os_version, "
+             "previous_os_version, config_number, whitelist_digest, task_id, language, "
+             "preferred_language, region",
+             "log"},
+    ViewForm{"scalars", "key, log, value", "scalar"},
+    ViewForm{"distributions", "key, log, minimum, maximum, mean, squared_deviations, count",
+             "distribution"},
+    ViewForm{"cells", "key, log, lower, upper, label, count", "cell"},
+    ViewForm{"applications", "bundle, version, uuid, orbo_id, arch, log, times", "activation"},
+};
+
+// Of logs that two loaders brought at once the one with the lowest number counts. Rows of logs that
+// are not filed were left by a load that was killed.
+void makeViews(Server& server, const std::string& database) {
+  for (const ViewForm& view : kViews)
+    server.ask("CREATE VIEW IF NOT EXISTS " + database + "." + view.name + " AS SELECT " +
+               view.columns + " FROM " + database + "." + view.table +
+               " WHERE log GLOBAL IN (SELECT min(log) FROM " + database + ".log GROUP BY digest)");
+}
+
+void checkVersion(const Server& server, std::string versions) {
+  if (!versions.empty() && versions.back() == '\n') versions.pop_back();
+  if (versions == kVersion) return;
+  for (char& c : versions)
+    if (c == '\n') c = ',';
+  throw EngineError(server.address().name + ": has tables of version " + versions +
+                    ", and this program knows version " + std::string(kVersion) +
+                    ": use the program that made them, or load the logs into a new database");
+}
+
+// Empty when the tables were not made, or not to the end.
+std::string versionsIn(Server& server, const std::string& database) {
+  try {
+    return server.ask("SELECT DISTINCT version FROM " + database +
+                      ".tavrel_schema ORDER BY version");
+  } catch (const ServerError& error) {
+    if (error.code == kUnknownTable || error.code == kUnknownDatabase) return {};
+    throw;
+  }
+}
+
+// The version is written last, so that tables with one are complete.
+void makeTables(Server& server, const std::string& database) {
+  server.ask("CREATE DATABASE IF NOT EXISTS " + database);
+  for (const TableForm& table : kTables)
+    server.ask("CREATE TABLE IF NOT EXISTS " + database + "." + table.name + " (" + table.columns +
+               ") ENGINE = MergeTree() ORDER BY (" + table.order + ")");
+  makeViews(server, database);
+  server.ask("INSERT INTO " + database + ".tavrel_schema SELECT toUInt32(" + std::string(kVersion) +
+             ")");
+}
+
+// One table for those of all servers, under the same name in a database of its own.
+void makeDistributedTables(Server& server, const std::string& database,
+                           const std::string& distributed) {
+  server.ask("CREATE DATABASE IF NOT EXISTS " + distributed);
+  for (const TableForm& table : kTables)
+    server.ask("CREATE TABLE IF NOT EXISTS " + distributed + "." + table.name + " (" +
+               table.columns + ") ENGINE = Distributed(" + server.address().cluster + ", " +
+               database + ", " + table.name + ", " + table.shard + ")");
+  makeViews(server, distributed);
+}
+
+}  // namespace
+
+void openTables(Server& server, bool writes) {
+  const ServerAddress& address = server.address();
+  std::string versions = versionsIn(server, address.database);
+  if (versions.empty() && writes) {
+    makeTables(server, address.database);
+    versions = kVersion;
+  }
+  if (versions.empty())
+    throw EngineError(address.name + ": there are no tables: load logs into it first");
+  checkVersion(server, versions);
+  server.use(address.database);
+  if (address.cluster.empty()) return;
+
+  const std::string distributed = address.database + "_" + address.cluster;
+  if (writes) makeDistributedTables(server, address.database, distributed);
+  versions = versionsIn(server, distributed);
+  if (versions.empty())
+    throw EngineError(address.name + ": not all servers of cluster " + address.cluster +
+                      " have the tables: load into each one once, without \"cluster\" in the "
+                      "address");
+  checkVersion(server, versions);
+  server.use(distributed);
+}
+
+}  // namespace tavrel::fleet

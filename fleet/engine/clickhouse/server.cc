@@ -1,0 +1,223 @@
+#include "fleet/engine/clickhouse/server.h"
+
+#include <algorithm>
+#include <array>
+#include <charconv>
+#include <curl/curl.h>
+#include <exception>
+#include <new>
+#include <thread>
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr int kAttempts = 5;
+constexpr std::chrono::milliseconds kFirstPause{250};
+constexpr long kConnectSeconds = 10;
+constexpr std::size_t kLongestComplaint = 64 * 1024;
+constexpr std::size_t kLongestReason = 300;
+
+// Codes of conditions that pass: time exceeded, too many queries, network trouble between servers,
+// too many parts that wait to be merged, no replica or shard reachable.
+constexpr std::array kPassingCodes = {159, 202, 203, 209, 210, 252, 279};
+
+template <class Argument>
+void set(CURL* handle, CURLoption option, Argument argument) {
+  if (curl_easy_setopt(handle, option, argument) == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
+}
+
+std::string encoded(std::string_view text) {
+  char* const out = curl_easy_escape(nullptr, text.data(), static_cast<int>(text.size()));
+  if (out == nullptr) throw std::bad_alloc();
+  std::string result = out;
+  curl_free(out);
+  return result;
+}
+
+int codeIn(std::string_view answer) {
+  constexpr std::string_view kPrefix = "Code: ";
+  const std::size_t at = answer.find(kPrefix);
+  int code = 0;
+  if (at != answer.npos) {
+    const char* const begin = answer.data() + at + kPrefix.size();
+    std::from_chars(begin, answer.data() + answer.size(), code);
+  }
+  return code;
+}
+
+// The server's sentence, without what surrounds it: "Code: 60, e.displayText() = DB::Exception:
+// Table default.x doesn't exist., e.what() = DB::Exception".
+std::string reasonIn(std::string_view answer) {
+  constexpr std::string_view kBegin = "DB::Exception: ";
+  if (const std::size_t at = answer.find(kBegin); at != answer.npos)
+    answer.remove_prefix(at + kBegin.size());
+  answer = answer.substr(0, answer.find(", e.what()"));
+  answer = answer.substr(0, answer.find(" (version "));
+  answer = answer.substr(0, answer.find("Stack trace"));
+  std::string reason;
+  for (const char c : answer.substr(0, kLongestReason))
+    reason += static_cast<unsigned char>(c) < ' ' || c == '\x7F' ? ' ' : c;
+  while (!reason.empty() && (reason.back() == ' ' || reason.back() == '.'))
+    reason.pop_back();
+  return reason;
+}
+
+}  // namespace
+
+// What the callback of one transfer works with.
+struct Server::Transfer {
+  CURL* handle;
+  const std::function<void(std::string_view)>& take;
+  std::string complaint;
+  std::exception_ptr failure;
+  bool handedOut = false;
+
+  static std::size_t receive(char* bytes, std::size_t size, std::size_t count, void* context) {
+    Transfer& transfer = *static_cast<Transfer*>(context);
+    long status = 0;
+    curl_easy_getinfo(transfer.handle, CURLINFO_RESPONSE_CODE, &status);
+    const std::string_view piece(bytes, size * count);
+    try {
+      if (status == 200) {
+        transfer.handedOut = true;
+        transfer.take(piece);
+      } else if (transfer.complaint.size() < kLongestComplaint) {
+        transfer.complaint += piece;
+      }
+    } catch (...) {
+      transfer.failure = std::current_exception();
+      return 0;
+    }
+    return piece.size();
+  }
+};
+
+Server::Server(ServerAddress address)
+    : address_(std::move(address)), handle_(nullptr, curl_easy_cleanup) {
+  if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
+  handle_.reset(curl_easy_init());
+  CURL* const handle = handle_.get();
+  if (handle == nullptr) throw std::bad_alloc();
+  set(handle, CURLOPT_NOSIGNAL, 1L);
+  set(handle, CURLOPT_PROTOCOLS_STR, "http,https");
+  set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
+  set(handle, CURLOPT_FOLLOWLOCATION, 0L);
+  set(handle, CURLOPT_PROXY, "");
+  set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
+  if (!address_.authorityFile.empty()) {
+    set(handle, CURLOPT_CAINFO, address_.authorityFile.c_str());
+    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // not the system's as well
+  }
+  if (!address_.user.empty()) {
+    set(handle, CURLOPT_HTTPAUTH, static_cast<long>(CURLAUTH_BASIC));
+    set(handle, CURLOPT_USERNAME, address_.user.c_str());
+    set(handle, CURLOPT_PASSWORD, address_.password.c_str());
+  }
+  set(handle, CURLOPT_CONNECTTIMEOUT, kConnectSeconds);
+  set(handle, CURLOPT_TIMEOUT, static_cast<long>(address_.timeout.count()));
+  set(handle, CURLOPT_POST, 1L);
+  set(handle, CURLOPT_WRITEFUNCTION, Transfer::receive);
+}
+
+Server::~Server() {
+  handle_.reset();
+  curl_global_cleanup();
+}
+
+// With this setting the server sends nothing before the statement has ended. Otherwise it would
+// append a late failure to the rows of a successful answer.
+std::string Server::urlWith(const std::string& statement) const {
+  std::string url = address_.url + "?wait_end_of_query=1";
+  if (!database_.empty()) url += "&database=" + database_;
+  // Rows are on all servers of a cluster before the answer says so.
+  if (!address_.cluster.empty()) url += "&insert_distributed_sync=1";
+  if (!statement.empty()) url += "&query=" + encoded(statement);
+  return url;
+}
+
+void Server::refuse(std::string_view answer, long status) const {
+  const int code = codeIn(answer);
+  std::string text = address_.name + ": ";
+  if (const std::string reason = reasonIn(answer); !reason.empty())
+    text += "the server refused: " + reason;
+  else
+    text += "the server answered with status " + std::to_string(status);
+  if (status >= 502 ||
+      std::find(kPassingCodes.begin(), kPassingCodes.end(), code) != kPassingCodes.end())
+    throw PassingError(text + ": try again later; what is filed already will count once");
+  if (status == 401 || code == 192 || code == 193 || code == 194 || code == 516)
+    throw ServerError(code, text + ": check the user and the password in the address");
+  throw ServerError(code, text + ": check the address and the server's log");
+}
+
+void Server::perform(const std::string& url, std::string_view body, bool isRepeatable,
+                     const std::function<void(std::string_view)>& take) {
+  CURL* const handle = handle_.get();
+  Transfer transfer{handle, take, {}, {}};
+  std::array<char, CURL_ERROR_SIZE> words{};
+  set(handle, CURLOPT_URL, url.c_str());
+  set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
+  set(handle, CURLOPT_POSTFIELDS, body.data());
+  set(handle, CURLOPT_WRITEDATA, &transfer);
+  set(handle, CURLOPT_ERRORBUFFER, words.data());
+  // On a connection that was used before, libcurl itself sends a request again when it gets no
+  // answer.
+  set(handle, CURLOPT_FRESH_CONNECT, isRepeatable ? 0L : 1L);
+  const CURLcode code = curl_easy_perform(handle);
+  set(handle, CURLOPT_ERRORBUFFER, static_cast<char*>(nullptr));
+  if (transfer.failure) std::rethrow_exception(transfer.failure);
+  if (code != CURLE_OK) {
+    const std::string text =
+        address_.name + ": " + (words[0] != '\0' ? words.data() : curl_easy_strerror(code));
+    if (transfer.handedOut) throw EngineError(text + ": the answer is incomplete; ask again");
+    throw PassingError(text + ": check that the server runs and can be reached, and try again");
+  }
+  long status = 0;
+  curl_easy_getinfo(handle, CURLINFO_RESPONSE_CODE, &status);
+  if (status != 200) refuse(transfer.complaint, status);
+}
+
+std::string Server::ask(std::string_view statement) {
+  std::string answer;
+  ask(statement, [&](std::string_view piece) { answer += piece; });
+  return answer;
+}
+
+void Server::ask(std::string_view statement, const std::function<void(std::string_view)>& take) {
+  retry([&] { perform(urlWith({}), statement, true, take); });
+}
+
+void Server::insert(const std::string& statement, std::string_view rows) {
+  perform(urlWith(statement), rows, false, [](std::string_view) {});
+}
+
+void retry(const std::function<void()>& operation) {
+  auto pause = kFirstPause;
+  for (int attempt = 1;; ++attempt) {
+    try {
+      return operation();
+    } catch (const PassingError&) {
+      if (attempt == kAttempts) throw;
+    }
+    std::this_thread::sleep_for(pause);
+    pause *= 2;
+  }
+}
+
+std::string quoted(std::string_view text) {
+  static constexpr char kDigits[] = "0123456789ABCDEF";
+  std::string out = "'";
+  for (const char c : text) {
+    const auto byte = static_cast<unsigned char>(c);
+    if (byte < ' ' || c == '\'' || c == '\\') {
+      out += "\\x";
+      out += kDigits[byte >> 4];
+      out += kDigits[byte & 0xF];
+    } else {
+      out += c;
+    }
+  }
+  return out + "'";
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,66 @@
+// A ClickHouse server, asked over HTTP.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <memory>
+#include <string>
+#include <string_view>
+
+#include "fleet/engine/clickhouse/address.h"
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+
+/// What the server answered to a statement that it did not carry out.
+struct ServerError : EngineError {
+  ServerError(int number, const std::string& text) : EngineError(text), code(number) {}
+  int code;  ///< ClickHouse's own; 0 when the answer has none
+};
+
+/// The server was away, too slow, or too busy. Whether it carried the statement out is not known.
+struct PassingError : EngineError {
+  using EngineError::EngineError;
+};
+
+class Server {
+ public:
+  explicit Server(ServerAddress address);
+  ~Server();
+
+  const ServerAddress& address() const { return address_; }
+
+  /// Statements refer to tables of this database from now on.
+  void use(std::string database) { database_ = std::move(database); }
+
+  /// Runs a statement and yields its answer.
+  std::string ask(std::string_view statement);
+
+  /// Hands the answer out in pieces, once the server has all of it. What `take` throws is passed
+  /// on.
+  void ask(std::string_view statement, const std::function<void(std::string_view)>& take);
+
+  /// Sends rows after the statement, which must name a format. Never sends them twice.
+  void insert(const std::string& statement, std::string_view rows);
+
+ private:
+  struct Transfer;
+
+  void perform(const std::string& url, std::string_view body, bool isRepeatable,
+               const std::function<void(std::string_view)>& take);
+  std::string urlWith(const std::string& statement) const;
+  [[noreturn]] void refuse(std::string_view answer, long status) const;
+
+  ServerAddress address_;
+  std::string database_;
+  std::unique_ptr<void, void (*)(void*)> handle_;
+};
+
+/// Runs the operation again, after growing pauses and at most five times, as long as it ends with a
+/// PassingError.
+void retry(const std::function<void()>& operation);
+
+/// `text` as a literal of the query language.
+std::string quoted(std::string_view text);
+
+}  // namespace tavrel::fleet
