@@ -129,18 +129,7 @@ std::int64_t Statement::integer(int column) const {
 }
 
 double Statement::real(int column) const {
-  switch (sqlite3_column_type(handle_.get(), column)) {
-    case SQLITE_NULL:
-      return kUsualNan;
-    case SQLITE_BLOB: {
-      double value = kUsualNan;
-      if (sqlite3_column_bytes(handle_.get(), column) == sizeof value)
-        std::memcpy(&value, sqlite3_column_blob(handle_.get(), column), sizeof value);
-      return value;
-    }
-    default:
-      return sqlite3_column_double(handle_.get(), column);
-  }
+  return realOf(sqlite3_column_value(handle_.get(), column));
 }
 
 std::string_view Statement::text(int column) const {

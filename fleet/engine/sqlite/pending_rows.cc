@@ -1,7 +1,5 @@
 #include "fleet/engine/sqlite/pending_rows.h"
 
-#include <array>
-#include <cmath>
 #include <sqlite3.h>
 
 #include "fleet/engine/sqlite/real.h"
@@ -95,13 +93,6 @@ constexpr sqlite3_module kModule = [] {
   return module;
 }();
 
-void setReal(sqlite3_context* result, double value) {
-  if (std::isnan(value) && !isUsualNan(value))
-    sqlite3_result_blob(result, &value, sizeof value, SQLITE_TRANSIENT);
-  else
-    sqlite3_result_double(result, value);
-}
-
 }  // namespace
 
 void addRowTable(const Connection& connection, const char* name, RowSource& source) {
@@ -116,13 +107,13 @@ void setResult(sqlite3_context* result, std::int64_t value, int) {
 void setResult(sqlite3_context* result, const FiveNumbers* numbers, int column) {
   switch (column) {
     case 1:
-      return setReal(result, numbers->minimum);
+      return setResult(result, numbers->minimum);
     case 2:
-      return setReal(result, numbers->maximum);
+      return setResult(result, numbers->maximum);
     case 3:
-      return setReal(result, numbers->mean);
+      return setResult(result, numbers->mean);
     case 4:
-      return setReal(result, numbers->squaredDeviations);
+      return setResult(result, numbers->squaredDeviations);
     default:
       return sqlite3_result_int64(result, static_cast<std::int64_t>(numbers->count));
   }

