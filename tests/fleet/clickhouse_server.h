@@ -62,6 +62,12 @@ class ClickhouseServer {
     waitpid(std::exchange(process, 0), nullptr, 0);
   }
 
+  void ask(const std::string& statement) const {
+    EXPECT_EQ(system(("curl -sfS http://127.0.0.1:" + std::to_string(port) + "/ -d \"" + statement +
+                      "\" >" + folder + "answer")
+                         .c_str()),
+              0);
+  }
   std::string address(const std::string& database, const std::string& user = "") const {
     return "clickhouse://" + user + "127.0.0.1:" + std::to_string(port) + "/" + database;
   }

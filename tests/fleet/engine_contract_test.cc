@@ -88,7 +88,7 @@ TEST_P(EngineContract, HandsOutWhatWasAppended) {
   EXPECT_THAT(keys, ElementsAre("0s", "0t", "1s", "1t", "2h"));
   const std::string name = "1795000001 ";
   const auto bits = bitsOf;
-  EXPECT_THAT(contentOf(*engine),
+  EXPECT_THAT(rowsIn(*engine),
               UnorderedElementsAreArray(
                   {name + "-3|Pellio 4.2 (16R349)|before|c|w|t|de|de-AT|region 1",
                    name + "s=-9223372036854775808", name + "t=9223372036854775807",
@@ -106,7 +106,7 @@ TEST_P(EngineContract, HandsOutWhatWasAppended) {
 TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   std::vector<LogRecord> records = fullRecords(0, 700);
   EXPECT_EQ(open()->append(records).added, 700u);
-  const auto expected = contentOf(*open());
+  const auto expected = rowsIn(*open());
   EXPECT_EQ(expected.size(), 700u * 7);
 
   const auto engine = openOther();
@@ -118,7 +118,7 @@ TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
     EXPECT_EQ(appended.known, known);
     EXPECT_EQ(appended.added, count - known);
   }
-  EXPECT_EQ(contentOf(*engine->reader()), expected);
+  EXPECT_EQ(rowsIn(*engine->reader()), expected);
 }
 
 TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
@@ -137,7 +137,7 @@ TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
   EXPECT_GE(added[0] + added[1], 240u);
   const auto engine = openOther();
   engine->append(records);
-  EXPECT_EQ(contentOf(*open()), contentOf(*engine));
+  EXPECT_EQ(rowsIn(*open()), rowsIn(*engine));
 }
 
 }  // namespace

@@ -28,7 +28,7 @@ inline std::string bitsOf(double value) {
 }
 
 /// Each row of a database, as lines in the order of their text. A log has the name of its creation.
-inline std::vector<std::string> contentOf(Engine& engine) {
+inline std::vector<std::string> rowsIn(Engine& engine) {
   std::vector<std::string> lines;
   std::map<LogId, std::string> names;
   engine.logs(INT32_MIN, INT32_MAX, [&](std::span<const LogRow> rows) {

@@ -16,6 +16,7 @@ constexpr std::string_view kPlain = "clickhouse://";
 constexpr std::string_view kEncrypted = "clickhouses://";
 constexpr std::streamsize kLongestPassword = 4096;
 constexpr int kLongestTimeout = 86'400;
+constexpr int kMostRetries = 20;
 
 [[noreturn]] void refuse(const std::string& what) {
   throw EngineError("the database's address " + what +
@@ -54,13 +55,14 @@ std::string passwordIn(const std::string& path) {
   return password;
 }
 
-std::chrono::seconds secondsIn(std::string_view text) {
-  int seconds = 0;
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), seconds);
-  if (error != std::errc() || end != text.data() + text.size() || seconds < 1 ||
-      seconds > kLongestTimeout)
-    refuse("needs a timeout from 1 to " + std::to_string(kLongestTimeout) + " seconds");
-  return std::chrono::seconds(seconds);
+int numberIn(const std::string& name, std::string_view text, int lowest, int highest) {
+  int number = 0;
+  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
+  if (error != std::errc() || end != text.data() + text.size() || number < lowest ||
+      number > highest)
+    refuse("needs a number from " + std::to_string(lowest) + " to " + std::to_string(highest) +
+           " as its " + name);
+  return number;
 }
 
 std::string decoded(std::string_view text) {
@@ -85,7 +87,9 @@ void readOptions(ServerAddress& address, std::string_view query) {
     } else if (name == "ca-file") {
       address.authorityFile = value;
     } else if (name == "timeout") {
-      address.timeout = secondsIn(value);
+      address.timeout = std::chrono::seconds(numberIn("timeout", value, 1, kLongestTimeout));
+    } else if (name == "retries") {
+      address.retries = numberIn("retries", value, 0, kMostRetries);
     } else {
       refuse("has the unknown option \"" + std::string(name) + '"');
     }

@@ -16,13 +16,14 @@ struct ServerAddress {
   std::string database;
   std::string cluster;                ///< empty without
   std::chrono::seconds timeout{300};  ///< of one request, with its answer
+  int retries = 7;                    ///< of a request that fails for a passing reason
 };
 
 /// Whether the text is meant as the address of a server.
 bool isServerAddress(std::string_view text);
 
 /// clickhouse[s]://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], with the options
-/// "cluster", "password-file", "ca-file" and "timeout" (in seconds). Throws EngineError.
+/// "cluster", "password-file", "ca-file", "timeout" (in seconds) and "retries". Throws EngineError.
 ServerAddress parseServerAddress(std::string_view text);
 
 }  // namespace tavrel::fleet

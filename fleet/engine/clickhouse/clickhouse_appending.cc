@@ -112,7 +112,7 @@ void ClickhouseAppending::insertPortion(std::span<const LogRecord* const> record
   };
   newKeys_.clear();
   try {
-    retry([&] {
+    server_.retry([&] {
       for (std::string* rows : {&logs_, &scalars_, &distributions_, &cells_, &activations_})
         rows->clear();
       LogId log = LogId{random_()} << 32 | random_();

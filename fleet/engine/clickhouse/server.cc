@@ -11,8 +11,8 @@
 namespace tavrel::fleet {
 namespace {
 
-constexpr int kAttempts = 5;
 constexpr std::chrono::milliseconds kFirstPause{250};
+constexpr std::chrono::milliseconds kLongestPause{30'000};
 constexpr long kConnectSeconds = 10;
 constexpr std::size_t kLongestComplaint = 64 * 1024;
 constexpr std::size_t kLongestReason = 300;
@@ -191,16 +191,16 @@ void Server::insert(const std::string& statement, std::string_view rows) {
   perform(urlWith(statement), rows, false, [](std::string_view) {});
 }
 
-void retry(const std::function<void()>& operation) {
+void Server::retry(const std::function<void()>& operation) const {
   auto pause = kFirstPause;
-  for (int attempt = 1;; ++attempt) {
+  for (int attempt = 0;; ++attempt) {
     try {
       return operation();
     } catch (const PassingError&) {
-      if (attempt == kAttempts) throw;
+      if (attempt == address_.retries) throw;
     }
     std::this_thread::sleep_for(pause);
-    pause *= 2;
+    pause = std::min(2 * pause, kLongestPause);
   }
 }
 

@@ -40,6 +40,10 @@ class Server {
   /// on.
   void ask(std::string_view statement, const std::function<void(std::string_view)>& take);
 
+  /// Runs the operation, again after pauses as long as it ends with a PassingError and the address
+  /// allows.
+  void retry(const std::function<void()>& operation) const;
+
   /// Sends rows after the statement, which must name a format. Never sends them twice.
   void insert(const std::string& statement, std::string_view rows);
 
@@ -55,10 +59,6 @@ class Server {
   std::string database_;
   std::unique_ptr<void, void (*)(void*)> handle_;
 };
-
-/// Runs the operation again, after growing pauses and at most five times, as long as it ends with a
-/// PassingError.
-void retry(const std::function<void()>& operation);
 
 /// `text` as a literal of the query language.
 std::string quoted(std::string_view text);

@@ -15,6 +15,7 @@ namespace {
 
 constexpr std::int64_t kApplicationId = 0x7461766C;  // "tavl"
 constexpr std::int64_t kVersion = 1;
+constexpr const char* kReadVersion = "PRAGMA user_version";
 
 static_assert(kPlaceBits == 14 && kNameBits == 25, "the views below compute with these numbers");
 
@@ -121,12 +122,18 @@ void createTables(Connection& connection) {
 }  // namespace
 
 Connection openFile(const std::string& path, bool writes) {
-  const Found found = look(path);
-  if (found == Found::kNothing && !writes)
-    throw EngineError(path + ": there is no database: load logs into it first");
+  const std::string nothing = path + ": there is no database: load logs into it first";
+  if (look(path) == Found::kNothing && !writes) throw EngineError(nothing);
   Connection connection(path, writes);
-  if (found == Found::kNothing) createTables(connection);
-  checkVersion(path, connection.integer("PRAGMA user_version"));
+  // A program that was killed while it made the tables left a file with a header, of which SQLite
+  // makes an empty one when it opens it.
+  std::int64_t version = connection.integer(kReadVersion);
+  if (version == 0 && writes) {
+    createTables(connection);
+    version = connection.integer(kReadVersion);
+  }
+  if (version == 0) throw EngineError(nothing);
+  checkVersion(path, version);
   if (writes) connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
   connection.execute("PRAGMA cache_size = -32768; PRAGMA mmap_size = 2147418112");
   return connection;

@@ -1,0 +1,216 @@
+// Kills, files that are no databases, servers that are away, refuse or are slow.
+#include <chrono>
+#include <gmock/gmock.h>
+#include <sqlite3.h>
+#include <thread>
+
+#include "fleet/engine/open/open_engine.h"
+#include "tests/fleet/clickhouse_server.h"
+#include "tests/fleet/engine_records.h"
+#include "tests/system/killed_process.h"
+
+namespace tavrel::fleet {
+namespace {
+
+using testing::HasSubstr;
+using testing::IsSubsetOf;
+
+std::string failureOf(const std::function<void()>& operation) {
+  try {
+    operation();
+  } catch (const EngineError& error) {
+    return error.what();
+  }
+  return "no failure";
+}
+
+std::string openingFailure(const std::string& where, OpenMode mode = OpenMode::kWrite) {
+  return failureOf([&] { openEngine(where, mode); });
+}
+
+std::vector<LogRecord> records(std::uint64_t count) {
+  std::vector<LogRecord> records;
+  for (std::uint64_t number = 0; number < count; ++number) {
+    records.push_back(makeRecord(number));
+    records.back().scalars = {{"a", 1}, {"b", static_cast<std::int64_t>(number)}};
+    records.back().cells = {{"c", 0, 1, "(0, 1]", number}};
+  }
+  return records;
+}
+
+void appendInPortions(const std::string& where, const std::vector<LogRecord>& records) {
+  const auto engine = openEngine(where, OpenMode::kWrite);
+  for (std::size_t first = 0; first < records.size(); first += 8)
+    engine->append(std::span(records).subspan(first, 8));
+}
+
+// Kills loaders at ever later moments; the next loader completes what each has begun.
+void killLoaders(const std::function<std::string(std::size_t)>& whereOf) {
+  const std::vector<LogRecord> all = records(16);
+  appendInPortions(whereOf(0), all);
+  const auto whole = rowsIn(*openEngine(whereOf(0), OpenMode::kRead));
+  ASSERT_EQ(whole.size(), 16u * 4);
+  std::size_t kills = 0;
+  for (std::size_t calls = 1; kills < 100; calls += 1 + calls / 12, ++kills) {
+    const std::string where = whereOf(calls);
+    if (!runUntilSystemCall(calls, [&] { appendInPortions(where, all); })) break;
+    const auto engine = openEngine(where, OpenMode::kWrite);
+    const auto left = rowsIn(*engine);
+    EXPECT_EQ(left.size() % (8 * 4), 0u) << calls;
+    EXPECT_THAT(left, IsSubsetOf(whole)) << calls;
+    engine->append(all);
+    ASSERT_EQ(rowsIn(*engine), whole) << calls;
+  }
+  EXPECT_GT(kills, 20u);
+  EXPECT_LT(kills, 100u);
+}
+
+TEST(EngineFaults, KilledLoaderOfAFileLeavesWholeAppends) {
+  const TemporaryRoot root;
+  killLoaders([&](std::size_t calls) { return root.root.path("/" + std::to_string(calls)); });
+}
+
+TEST(EngineFaults, KilledLoaderOfAServerLeavesWholeAppends) {
+  const ClickhouseServer server;
+  killLoaders([&](std::size_t calls) { return server.address("d" + std::to_string(calls)); });
+}
+
+TEST(EngineFaults, LeavesFilesAloneThatAreNotItsOwn) {
+  const TemporaryRoot root;
+  const std::string path = root.root.path("/file");
+  const auto sql = [&](const char* statements) {
+    sqlite3* connection = nullptr;
+    sqlite3_open(path.c_str(), &connection);
+    EXPECT_EQ(sqlite3_exec(connection, statements, nullptr, nullptr, nullptr), SQLITE_OK);
+    sqlite3_close(connection);
+  };
+  const auto expectRefusal = [&](const std::string& failure) {
+    const std::string before = contentOf(std::filesystem::path(path));
+    EXPECT_EQ(openingFailure(path, OpenMode::kRead), path + failure);
+    EXPECT_EQ(openingFailure(path), path + failure);
+    EXPECT_EQ(contentOf(std::filesystem::path(path)), before);
+  };
+  EXPECT_EQ(openingFailure(path, OpenMode::kRead),
+            path + ": there is no database: load logs into it first");
+  EXPECT_FALSE(std::filesystem::exists(path));
+  EXPECT_THAT(openingFailure(root.root.path("/")), HasSubstr(": cannot be read: name a file"));
+  EXPECT_THAT(openingFailure(root.root.path("/no/file")),
+              HasSubstr("/no/file: unable to open database file (No such file or directory): check "
+                        "owner and permissions of the file and its folder"));
+  root.write("/file", std::string(200, 'x'));
+  expectRefusal(": is not a database: name another file");
+  root.write("/file", "SQLite format 3");
+  expectRefusal(": is not a database: name another file");
+  std::filesystem::remove(path);
+  sql("CREATE TABLE t(a)");
+  expectRefusal(": is another program's database: name another file");
+  std::filesystem::remove(path);
+  openEngine(path, OpenMode::kWrite);
+  sql("PRAGMA user_version = 7; PRAGMA journal_mode = DELETE");
+  expectRefusal(
+      ": has tables of version 7, and this program knows version 1: use the program that made it, "
+      "or load the logs into a new file");
+}
+
+TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
+  const TemporaryRoot root;
+  root.write("/long", std::string(5000, 'x'));
+  const std::string advice = ": write clickhouse://[USER@]HOST[:PORT]/DATABASE[?cluster=NAME]";
+  const std::pair<std::string, std::string> cases[] = {
+      {"clickhouse://", "is malformed"},
+      {"clickhouse://h:x/d", "is malformed"},
+      {"clickhouse://h", "needs a name of letters, digits and underscores as its database"},
+      {"clickhouse://h/a;b", "needs a name of letters, digits and underscores as its database"},
+      {"clickhouse://h/d?cluster=",
+       "needs a name of letters, digits and underscores as its cluster"},
+      {"clickhouse://h/d?timeout=0", "needs a number from 1 to 86400 as its timeout"},
+      {"clickhouse://h/d?retries=1x", "needs a number from 0 to 20 as its retries"},
+      {"clickhouse://h/d?a=b", "has the unknown option \"a\""}};
+  for (const auto& [address, failure] : cases)
+    EXPECT_EQ(openingFailure(address), "the database's address " + failure + advice) << address;
+  EXPECT_THAT(openingFailure("clickhouse://h/d?password-file=" + root.root.path("/long")),
+              HasSubstr("/long: cannot be read as a password"));
+}
+
+TEST(EngineFaults, TellsWhatTheServerSays) {
+  const ClickhouseServer server;
+  const std::string address = server.address("d");
+  EXPECT_EQ(openingFailure(address, OpenMode::kRead),
+            address + ": there are no tables: load logs into it first");
+  EXPECT_THAT(openingFailure(server.address("d", "fleet:wrong@")),
+              HasSubstr(address + ": the server refused: "));
+  EXPECT_THAT(openingFailure(server.address("d", "fleet:wrong@")),
+              HasSubstr(": check the user and the password in the address"));
+  server.root.write("/password", "se'cret\n");
+  EXPECT_EQ(openingFailure(server.address("d", "fleet:se%27cret@")), "no failure");
+  EXPECT_EQ(openingFailure(server.address("d", "fleet@") + "?password-file=" + server.folder +
+                           "password"),
+            "no failure");
+  server.ask("INSERT INTO d.tavrel_schema SELECT 7");
+  EXPECT_EQ(openingFailure(address),
+            address +
+                ": has tables of version 1,7, and this program knows version 1: use the "
+                "program that made them, or load the logs into a new database");
+}
+
+TEST(EngineFaults, WaitsForAServerThatStartsAgain) {
+  ClickhouseServer server;
+  const std::vector<LogRecord> all = records(400);
+  const auto engine = openEngine(server.address("d"), OpenMode::kWrite);
+  std::jthread trouble([&] {
+    for (int i = 0; i < 3; ++i) {
+      server.end();
+      server.start();
+      usleep(100'000);
+    }
+  });
+  for (std::size_t first = 0; first < all.size(); first += 8)
+    engine->append(std::span(all).subspan(first, 8));
+  trouble.join();
+  const TemporaryRoot root;
+  appendInPortions(root.root.path("/d"), all);
+  EXPECT_EQ(rowsIn(*engine), rowsIn(*openEngine(root.root.path("/d"), OpenMode::kRead)));
+  server.end();
+  EXPECT_THAT(
+      openingFailure(server.address("d") + "?retries=1"),
+      HasSubstr("Couldn't connect to server: check that the server runs and can be reached, "
+                "and try again"));
+}
+
+TEST(EngineFaults, BoundsItsPatience) {
+  int requests = 0;
+  std::string answer;
+  ScriptedServer server([&](const std::string&) {
+    ++requests;
+    return answer;
+  });
+  std::string name = server.url();
+  name = "clickhouse" + name.substr(4, name.rfind('/') - 3) + "d";
+  const auto expect = [&](const std::string& options, const std::string& failure, int expected) {
+    requests = 0;
+    EXPECT_EQ(openingFailure(name + options), name + ": " + failure);
+    EXPECT_EQ(requests, expected);
+  };
+  const auto answerWith = [&](const std::string& status, const std::string& body) {
+    answer = "HTTP/1.1 " + status + "\r\nContent-Length: " + std::to_string(body.size()) +
+             "\r\n\r\n" + body;
+  };
+  answerWith("500 Error",
+             "Code: 252, e.displayText() = DB::Exception: Too many parts., e.what() = DB::E\n");
+  expect("?retries=1",
+         "the server refused: Too many parts: try again later; what is filed already will count "
+         "once",
+         2);
+  answerWith("500 Error", "Code: 8, e.displayText() = DB::Exception: A\nb\x1B[0m, e.what()");
+  expect("", "the server refused: A b [0m: check the address and the server's log", 1);
+  answerWith("404 Not Found", "");
+  expect("", "the server answered with status 404: check the address and the server's log", 1);
+  answerWith("200 OK", "1");
+  answer.replace(answer.find(": 1"), 3, ": 9");
+  server.closesAfterAnswer = true;
+  expect("", "transfer closed with 8 bytes remaining to read: the answer is incomplete; ask again",
+         1);
+}
+
+}  // namespace
+}  // namespace tavrel::fleet
