@@ -62,11 +62,13 @@ class ClickhouseServer {
     waitpid(std::exchange(process, 0), nullptr, 0);
   }
 
-  void ask(const std::string& statement) const {
-    EXPECT_EQ(system(("curl -sfS http://127.0.0.1:" + std::to_string(port) + "/ -d \"" + statement +
-                      "\" >" + folder + "answer")
+  std::string ask(const std::string& statement, const std::string& database = "default") const {
+    root.write("/statement", statement);
+    EXPECT_EQ(system(("cd " + folder + " && curl -sfS http://127.0.0.1:" + std::to_string(port) +
+                      "/?database=" + database + " -d @statement >answer")
                          .c_str()),
               0);
+    return contentOf(folder + "answer");
   }
   std::string address(const std::string& database, const std::string& user = "") const {
     return "clickhouse://" + user + "127.0.0.1:" + std::to_string(port) + "/" + database;

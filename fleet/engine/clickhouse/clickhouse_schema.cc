@@ -8,9 +8,6 @@ namespace {
 
 constexpr std::string_view kVersion = "1";
 
-constexpr int kUnknownTable = 60;
-constexpr int kUnknownDatabase = 81;
-
 struct TableForm {
   const char* name;
   const char* columns;
@@ -86,7 +83,8 @@ std::string versionsIn(Server& server, const std::string& database) {
     return server.ask("SELECT DISTINCT version FROM " + database +
                       ".tavrel_schema ORDER BY version");
   } catch (const ServerError& error) {
-    if (error.code == kUnknownTable || error.code == kUnknownDatabase) return {};
+    if (error.code == ServerError::kUnknownTable || error.code == ServerError::kUnknownDatabase)
+      return {};
     throw;
   }
 }

@@ -35,6 +35,8 @@ std::string encoded(std::string_view text) {
 }
 
 int codeIn(std::string_view answer) {
+  // A server of a cluster reports another one's missing table among failures to connect.
+  if (answer.find("There is no table") != answer.npos) return ServerError::kUnknownTable;
   constexpr std::string_view kPrefix = "Code: ";
   const std::size_t at = answer.find(kPrefix);
   int code = 0;
@@ -48,7 +50,7 @@ int codeIn(std::string_view answer) {
 // The server's sentence, without what surrounds it: "Code: 60, e.displayText() = DB::Exception:
 // Table default.x doesn't exist., e.what() = DB::Exception".
 std::string reasonIn(std::string_view answer) {
-  constexpr std::string_view kBegin = "DB::Exception: ";
+  constexpr std::string_view kBegin = "Exception: ";
   if (const std::size_t at = answer.find(kBegin); at != answer.npos)
     answer.remove_prefix(at + kBegin.size());
   answer = answer.substr(0, answer.find(", e.what()"));

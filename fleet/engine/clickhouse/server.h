@@ -14,6 +14,9 @@ namespace tavrel::fleet {
 
 /// What the server answered to a statement that it did not carry out.
 struct ServerError : EngineError {
+  static constexpr int kUnknownTable = 60;
+  static constexpr int kUnknownDatabase = 81;
+
   ServerError(int number, const std::string& text) : EngineError(text), code(number) {}
   int code;  ///< ClickHouse's own; 0 when the answer has none
 };

@@ -49,24 +49,24 @@ CREATE VIEW logs AS
 CREATE VIEW scalars AS
   SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, r.value
   FROM key k CROSS JOIN block b CROSS JOIN scalar r
-    ON r.id BETWEEN b.id << 39 | k.id << 14 AND b.id << 39 | k.id << 14 | 16383
+    ON r.id BETWEEN (b.id << 39) + (k.id << 14) AND (b.id << 39) + (k.id << 14) + 16383
   WHERE k.kind = 0;
 CREATE VIEW distributions AS
   SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, r.minimum, r.maximum, r.mean,
     r.squared_deviations, r.count
   FROM key k CROSS JOIN block b CROSS JOIN distribution r
-    ON r.id BETWEEN b.id << 39 | k.id << 14 AND b.id << 39 | k.id << 14 | 16383
+    ON r.id BETWEEN (b.id << 39) + (k.id << 14) AND (b.id << 39) + (k.id << 14) + 16383
   WHERE k.kind = 1;
 CREATE VIEW cells AS
   SELECT k.name AS key, b.first_log + (r.id & 16383) AS log, u.lower, u.upper, u.label, r.count
   FROM key k CROSS JOIN bucket u ON u.key = k.id CROSS JOIN block b CROSS JOIN cell r
-    ON r.id BETWEEN b.id << 39 | u.id << 14 AND b.id << 39 | u.id << 14 | 16383
+    ON r.id BETWEEN (b.id << 39) + (u.id << 14) AND (b.id << 39) + (u.id << 14) + 16383
   WHERE k.kind = 2;
 CREATE VIEW applications AS
   SELECT a.bundle, a.version, a.uuid, a.orbo_id, a.arch, b.first_log + (r.id & 16383) AS log,
     r.times
   FROM application a CROSS JOIN block b CROSS JOIN activation r
-    ON r.id BETWEEN b.id << 39 | a.id << 14 AND b.id << 39 | a.id << 14 | 16383;
+    ON r.id BETWEEN (b.id << 39) + (a.id << 14) AND (b.id << 39) + (a.id << 14) + 16383;
 )";
 
 enum class Found { kNothing, kDatabase };

@@ -1,0 +1,99 @@
+// The tables as people and other programs see them, and tables on several servers.
+#include <gmock/gmock.h>
+#include <sqlite3.h>
+
+#include "fleet/engine/open/open_engine.h"
+#include "tests/fleet/clickhouse_server.h"
+#include "tests/fleet/engine_records.h"
+
+namespace tavrel::fleet {
+namespace {
+
+std::vector<LogRecord> records(std::uint64_t count) {
+  std::vector<LogRecord> records;
+  for (std::uint64_t number = 0; number < count; ++number) {
+    LogRecord record = makeRecord(number);
+    const auto value = static_cast<std::int64_t>(number);
+    record.scalars = {{"a", value * 3}, {"b", 1}};
+    record.distributions = {{"d", {0.5, 1, 0.75, 0.125, 2}}};
+    record.cells = {{"h", 0, 1, "(0, 1]", number}, {"h", 1, 2, "(1, 2]", 1}};
+    record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
+    records.push_back(std::move(record));
+  }
+  return records;
+}
+
+// Statements that run on both engines, and their answers for 600 logs.
+const std::pair<std::string, std::string> kQuestions[] = {
+    {"SELECT count(*), min(day), sum(created) FROM logs", "600\t20781\t1077000179700\n"},
+    {"SELECT sum(value), count(*) FROM scalars WHERE key = 'a'", "539100\t600\n"},
+    {"SELECT sum(minimum + maximum + mean + squared_deviations) FROM distributions WHERE key = 'd'",
+     "1425\n"},
+    {"SELECT label, sum(count), min(lower), max(upper) FROM cells WHERE key = 'h' GROUP BY label "
+     "ORDER BY label",
+     "(0, 1]\t179700\t0\t1\n(1, 2]\t600\t1\t2\n"},
+    {"SELECT bundle, sum(times) FROM applications GROUP BY bundle", "com.example\t1200\n"},
+    {"SELECT sum(value) FROM scalars WHERE key = 'a' AND log IN (SELECT log FROM logs WHERE region "
+     "= 'region 7')",
+     "21\n"}};
+
+TEST(EngineTables, AnswerTheSameStatementsOnBothEngines) {
+  const TemporaryRoot root;
+  const std::string path = root.root.path("/d");
+  const ClickhouseServer server;
+  for (const std::string& where : {path, server.address("d")})
+    openEngine(where, OpenMode::kWrite)->append(records(600));
+  sqlite3* connection = nullptr;
+  sqlite3_open_v2(path.c_str(), &connection, SQLITE_OPEN_READONLY, nullptr);
+  const auto addRow = [](void* answer, int columns, char** values, char**) {
+    for (int i = 0; i < columns; ++i) {
+      std::string value = values[i];
+      if (value.ends_with(".0")) value.resize(value.size() - 2);
+      *static_cast<std::string*>(answer) += value + (i + 1 < columns ? '\t' : '\n');
+    }
+    return 0;
+  };
+  for (const auto& [question, expected] : kQuestions) {
+    std::string answer;
+    EXPECT_EQ(sqlite3_exec(connection, question.c_str(), addRow, &answer, nullptr), SQLITE_OK);
+    EXPECT_EQ(answer, expected) << question;
+    EXPECT_EQ(server.ask(question, "d"), expected) << question;
+  }
+  sqlite3_close(connection);
+}
+
+TEST(EngineTables, AreSharedByTheServersOfACluster) {
+  int first = 0;
+  int second = 0;
+  listenAtFreePort(first);
+  listenAtFreePort(second);
+  const ClickhouseServer one({first, second});
+  const ClickhouseServer two({second, first});
+  const std::string address = one.address("d") + "?cluster=pair";
+  std::string failure;
+  try {
+    openEngine(address, OpenMode::kWrite);
+  } catch (const EngineError& error) {
+    failure = error.what();
+  }
+  EXPECT_EQ(failure, one.address("d") +
+                         ": not all servers of cluster pair have the tables: load into each one "
+                         "once, without \"cluster\" in the address");
+  openEngine(two.address("d"), OpenMode::kWrite)->append(records(20));
+  const auto engine = openEngine(address, OpenMode::kWrite);
+  EXPECT_EQ(engine->append(records(600)).known, 20u);
+  // A loader that knows one server only brings what another one has.
+  openEngine(one.address("d"), OpenMode::kWrite)->append(records(40));
+  EXPECT_NE(one.ask("SELECT count() FROM d.log"), "0\n");
+  EXPECT_GT(std::stoi(two.ask("SELECT count() FROM d.log")), 20);
+
+  const TemporaryRoot root;
+  const auto file = openEngine(root.root.path("/d"), OpenMode::kWrite);
+  file->append(records(600));
+  EXPECT_EQ(rowsIn(*engine), rowsIn(*file));
+  for (const auto& [question, expected] : kQuestions)
+    EXPECT_EQ(one.ask(question, "d_pair"), expected) << question;
+}
+
+}  // namespace
+}  // namespace tavrel::fleet
