@@ -91,8 +91,8 @@ class Engine {
   /// further ones.
   virtual std::vector<Key> keys() = 0;
 
-  // The rows of one key, of all days. A key without rows has none. Rows of logs that `logs` does not
-  // hand out do not count: a load that was killed may have left some.
+  // The rows of one key, of all days. A key without rows has none. Rows of logs that `logs` does
+  // not hand out do not count: a load that was killed may have left some.
   virtual void scalars(std::string_view key, const Visitor<ScalarValue>& visit) = 0;
   virtual void distributions(std::string_view key, const Visitor<DistributionValue>& visit) = 0;
   virtual void cells(std::string_view key, const Visitor<CellValue>& visit) = 0;
