@@ -200,16 +200,18 @@ void scan(const char* where, std::size_t readers) {
         std::size_t ownRows = 0;
         std::int64_t ownSum = 0;
         for (std::size_t i = next++; i < keys.size(); i = next++) {
-          if (keys[i].kind == KeyKind::kScalar)
+          if (keys[i].kind == KeyKind::kScalar) {
             own->scalars(keys[i].name, [&](std::span<const ScalarValue> values) {
               ownRows += values.size();
               for (const ScalarValue& value : values)
                 ownSum += value.value;
             });
-          if (keys[i].kind == KeyKind::kDistribution)
+          }
+          if (keys[i].kind == KeyKind::kDistribution) {
             own->distributions(keys[i].name, [&](std::span<const DistributionValue> values) {
               ownRows += values.size();
             });
+          }
         }
         rows += ownRows;
         sum += ownSum;
@@ -227,12 +229,13 @@ int main(int count, char** arguments) {
   const auto number = [&](int index, std::size_t otherwise) {
     return index < count ? std::stoul(arguments[index]) : otherwise;
   };
-  if (what == "append")
+  if (what == "append") {
     append(arguments[2], number(3, 10'000), number(4, 1000));
-  else if (what == "floor")
+  } else if (what == "floor") {
     insertRows(arguments[2], number(3, 10'000), number(4, 1000));
-  else if (what == "scan")
+  } else if (what == "scan") {
     scan(arguments[2], number(3, 1));
-  else
+  } else {
     return 2;
+  }
 }

@@ -52,7 +52,8 @@ constexpr double kInfinity = std::numeric_limits<double>::infinity();
 LogRecord fullRecord(std::uint64_t number) {
   LogRecord record = makeRecord(number);
   const auto value = static_cast<std::int64_t>(number);
-  record.scalars = {{"a", value}, {"b", -value}, {"über\n'\"", INT64_MIN}};
+  record.scalars = {
+      {"a", value}, {"b", -value}, {std::string_view("über\n'\"\0\\", 11), INT64_MIN}};
   record.distributions = {{"a", {1.5, 2.5, 2, 0.25, number}}};
   record.cells = {{"a", -kInfinity, 1, "(-inf, 1]", number}, {"a", 1, kInfinity, "(1, inf)", 1}};
   record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
@@ -107,7 +108,7 @@ TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   std::vector<LogRecord> records = fullRecords(0, 700);
   EXPECT_EQ(open()->append(records).added, 700u);
   const auto expected = rowsIn(*open());
-  EXPECT_EQ(expected.size(), 700u * 7);
+  EXPECT_EQ(expected.size(), 4900u);
 
   const auto engine = openOther();
   std::shuffle(records.begin(), records.end(), std::mt19937(5));

@@ -49,14 +49,14 @@ void killLoaders(const std::function<std::string(std::size_t)>& whereOf) {
   const std::vector<LogRecord> all = records(16);
   appendInPortions(whereOf(0), all);
   const auto whole = rowsIn(*openEngine(whereOf(0), OpenMode::kRead));
-  ASSERT_EQ(whole.size(), 16u * 4);
+  ASSERT_EQ(whole.size(), 64u);
   std::size_t kills = 0;
   for (std::size_t calls = 1; kills < 100; calls += 1 + calls / 12, ++kills) {
     const std::string where = whereOf(calls);
     if (!runUntilSystemCall(calls, [&] { appendInPortions(where, all); })) break;
     const auto engine = openEngine(where, OpenMode::kWrite);
     const auto left = rowsIn(*engine);
-    EXPECT_EQ(left.size() % (8 * 4), 0u) << calls;
+    EXPECT_EQ(left.size() % 32, 0u) << calls;
     EXPECT_THAT(left, IsSubsetOf(whole)) << calls;
     engine->append(all);
     ASSERT_EQ(rowsIn(*engine), whole) << calls;
@@ -175,6 +175,15 @@ TEST(EngineFaults, WaitsForAServerThatStartsAgain) {
       openingFailure(server.address("d") + "?retries=1"),
       HasSubstr("Couldn't connect to server: check that the server runs and can be reached, "
                 "and try again"));
+}
+
+TEST(EngineFaults, SpeaksTlsWithWhomItMay) {
+  const Nginx proxy;
+  const std::string where =
+      "clickhouses://127.0.0.1:" + std::to_string(proxy.port) + "/d?retries=0";
+  EXPECT_THAT(openingFailure(where), HasSubstr("SSL certificate problem"));
+  EXPECT_THAT(openingFailure(where + "&ca-file=" + proxy.folder + "ca.crt"),
+              HasSubstr("/d: the server answered with status 400"));
 }
 
 TEST(EngineFaults, BoundsItsPatience) {

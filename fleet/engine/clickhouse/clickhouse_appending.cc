@@ -69,8 +69,9 @@ ClickhouseAppending::Records ClickhouseAppending::unknownOf(std::span<const LogR
       known.insert(answer.substr(at, 32));
   }
   Records fresh;
-  for (const LogRecord& record : records)
+  for (const LogRecord& record : records) {
     if (known.insert(std::string(bytesOf(record))).second) fresh.push_back(&record);
+  }
   return fresh;
 }
 
@@ -100,9 +101,10 @@ void ClickhouseAppending::addRows(const LogRecord& record, LogId log) {
     addKey(KeyKind::kHistogram, row.key);
     putAll(cells_, row.key, log, row.lower, row.upper, row.label, row.count);
   }
-  for (const ApplicationRow& row : record.applications)
+  for (const ApplicationRow& row : record.applications) {
     putAll(activations_, row.bundle, log, row.version, row.uuid, row.orboID, row.arch,
            std::uint64_t{1});
+  }
 }
 
 void ClickhouseAppending::insertPortion(std::span<const LogRecord* const> records) {

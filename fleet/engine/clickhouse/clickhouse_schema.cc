@@ -1,5 +1,6 @@
 #include "fleet/engine/clickhouse/clickhouse_schema.h"
 
+#include <algorithm>
 #include <array>
 #include <string>
 
@@ -61,17 +62,17 @@ constexpr std::array kViews = {
 // Of logs that two loaders brought at once the one with the lowest number counts. Rows of logs that
 // are not filed were left by a load that was killed.
 void makeViews(Server& server, const std::string& database) {
-  for (const ViewForm& view : kViews)
+  for (const ViewForm& view : kViews) {
     server.ask("CREATE VIEW IF NOT EXISTS " + database + "." + view.name + " AS SELECT " +
                view.columns + " FROM " + database + "." + view.table +
                " WHERE log GLOBAL IN (SELECT min(log) FROM " + database + ".log GROUP BY digest)");
+  }
 }
 
 void checkVersion(const Server& server, std::string versions) {
   if (!versions.empty() && versions.back() == '\n') versions.pop_back();
   if (versions == kVersion) return;
-  for (char& c : versions)
-    if (c == '\n') c = ',';
+  std::replace(versions.begin(), versions.end(), '\n', ',');
   throw EngineError(server.address().name + ": has tables of version " + versions +
                     ", and this program knows version " + std::string(kVersion) +
                     ": use the program that made them, or load the logs into a new database");
@@ -92,9 +93,10 @@ std::string versionsIn(Server& server, const std::string& database) {
 // The version is written last, so that tables with one are complete.
 void makeTables(Server& server, const std::string& database) {
   server.ask("CREATE DATABASE IF NOT EXISTS " + database);
-  for (const TableForm& table : kTables)
+  for (const TableForm& table : kTables) {
     server.ask("CREATE TABLE IF NOT EXISTS " + database + "." + table.name + " (" + table.columns +
                ") ENGINE = MergeTree() ORDER BY (" + table.order + ")");
+  }
   makeViews(server, database);
   server.ask("INSERT INTO " + database + ".tavrel_schema SELECT toUInt32(" + std::string(kVersion) +
              ")");
@@ -104,10 +106,11 @@ void makeTables(Server& server, const std::string& database) {
 void makeDistributedTables(Server& server, const std::string& database,
                            const std::string& distributed) {
   server.ask("CREATE DATABASE IF NOT EXISTS " + distributed);
-  for (const TableForm& table : kTables)
+  for (const TableForm& table : kTables) {
     server.ask("CREATE TABLE IF NOT EXISTS " + distributed + "." + table.name + " (" +
                table.columns + ") ENGINE = Distributed(" + server.address().cluster + ", " +
                database + ", " + table.name + ", " + table.shard + ")");
+  }
   makeViews(server, distributed);
 }
 

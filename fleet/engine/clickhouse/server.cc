@@ -48,11 +48,12 @@ int codeIn(std::string_view answer) {
 }
 
 // The server's sentence, without what surrounds it: "Code: 60, e.displayText() = DB::Exception:
-// Table default.x doesn't exist., e.what() = DB::Exception".
+// Table default.x doesn't exist., e.what() = DB::Exception". Empty when another program answered.
 std::string reasonIn(std::string_view answer) {
   constexpr std::string_view kBegin = "Exception: ";
-  if (const std::size_t at = answer.find(kBegin); at != answer.npos)
-    answer.remove_prefix(at + kBegin.size());
+  const std::size_t begin = answer.find(kBegin);
+  if (begin == answer.npos) return {};
+  answer.remove_prefix(begin + kBegin.size());
   answer = answer.substr(0, answer.find(", e.what()"));
   answer = answer.substr(0, answer.find(" (version "));
   answer = answer.substr(0, answer.find("Stack trace"));
@@ -140,10 +141,9 @@ std::string Server::urlWith(const std::string& statement) const {
 void Server::refuse(std::string_view answer, long status) const {
   const int code = codeIn(answer);
   std::string text = address_.name + ": ";
-  if (const std::string reason = reasonIn(answer); !reason.empty())
-    text += "the server refused: " + reason;
-  else
-    text += "the server answered with status " + std::to_string(status);
+  const std::string reason = reasonIn(answer);
+  text += reason.empty() ? "the server answered with status " + std::to_string(status)
+                         : "the server refused: " + reason;
   if (status >= 502 ||
       std::find(kPassingCodes.begin(), kPassingCodes.end(), code) != kPassingCodes.end())
     throw PassingError(text + ": try again later; what is filed already will count once");

@@ -129,10 +129,11 @@ void Appending::addRows(const LogRecord& record) {
   for (const ApplicationRow& row : record.applications) {
     const std::int64_t application = names_.application(row);
     auto* const last = activations_.last(application);
-    if (last != nullptr && last->place == place)
+    if (last != nullptr && last->place == place) {
       ++last->payload;
-    else
+    } else {
       activations_.add(application, place, 1);
+    }
   }
 }
 

@@ -92,10 +92,11 @@ void Statement::bind(int index, std::int64_t value) {
 }
 
 void Statement::bind(int index, double value) {
-  if (std::isnan(value) && !isUsualNan(value))
+  if (std::isnan(value) && !isUsualNan(value)) {
     check(sqlite3_bind_blob64(handle_.get(), index, &value, sizeof value, SQLITE_TRANSIENT));
-  else
+  } else {
     check(sqlite3_bind_double(handle_.get(), index, value));
+  }
 }
 
 void Statement::bind(int index, std::string_view text) {

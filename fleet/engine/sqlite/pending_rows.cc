@@ -65,10 +65,11 @@ int isAtEnd(sqlite3_vtab_cursor* cursor) {
 }
 
 int column(sqlite3_vtab_cursor* cursor, sqlite3_context* result, int number) {
-  if (number == 0)
+  if (number == 0) {
     sqlite3_result_int64(result, sourceOf(cursor).id());
-  else
+  } else {
     sourceOf(cursor).value(result, number);
+  }
   return SQLITE_OK;
 }
 

@@ -22,10 +22,11 @@ double realOf(sqlite3_value* value) {
 }
 
 void setResult(sqlite3_context* result, double value) {
-  if (std::isnan(value) && !isUsualNan(value))
+  if (std::isnan(value) && !isUsualNan(value)) {
     sqlite3_result_blob(result, &value, sizeof value, SQLITE_TRANSIENT);
-  else
+  } else {
     sqlite3_result_double(result, value);
+  }
 }
 
 }  // namespace tavrel::fleet
