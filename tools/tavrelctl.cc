@@ -3,10 +3,8 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <exception>
-#include <ostream>
 #include <string_view>
 
-#include "base/format.h"
 #include "base/version.h"
 #include "tools/catalogue/catalogue_command.h"
 #include "tools/completion/completion_command.h"
@@ -28,29 +26,12 @@
 #include "tools/rehearsal/rehearse_command.h"
 #include "tools/report/registry_commands.h"
 #include "tools/report/report_commands.h"
+#include "tools/shared/command_line.h"
 #include "tools/stat/stat_commands.h"
 #include "tools/whitelist/whitelist_commands.h"
 
 namespace tavrel {
 namespace {
-
-// What is wrong with a command line, and which subcommand's help to read.
-std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
-  const CLI::App* command = &app;
-  std::string line = app.get_name();
-  while (!command->get_subcommands().empty()) {
-    command = command->get_subcommands().front();
-    line += ' ' + command->get_name();
-  }
-  std::string fault = error.what();
-  const auto unknown = app.remaining(true);
-  if (dynamic_cast<const CLI::RequiredError*>(&error) != nullptr && !unknown.empty() &&
-      command->get_require_subcommand_min() > 0) {
-    const char* const what = unknown.front().starts_with('-') ? "option" : "subcommand";
-    fault = format("no %s '%s'", what, unknown.front());
-  }
-  return format("%s: see '%s --help'", fault, line);
-}
 
 void addGlobalOptions(CLI::App& app, ToolContext& context) {
   app.fallthrough();
@@ -128,15 +109,7 @@ void run(const std::vector<std::string>& arguments, ToolContext& context) {
   }
   if (named == kCompletion) addCompletionCommand(top, context);
 
-  try {
-    app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
-  } catch (const CLI::ParseError& error) {
-    if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
-      app.exit(error, context.out(), context.error());
-    } else {
-      context.failUsage(usageFault(app, error));
-    }
-  }
+  runCommandLine(app, arguments, context);
 }
 
 }  // namespace
@@ -148,8 +121,7 @@ int runTavrelctl(const std::vector<std::string>& arguments, const ToolStreams& s
   } catch (const std::exception& error) {
     context.fail(error.what());
   }
-  streams.out.flush();
-  if (!streams.out) context.fail("cannot write standard output: free space or check the pipe");
+  context.finish();
   return context.exitStatus();
 }
 

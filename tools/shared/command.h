@@ -1,5 +1,5 @@
-// Subcommands and their options, over CLI11; only command.cc, command_model.cc and
-// tavrelctl.cc include its headers.
+// Subcommands and their options, over CLI11; only command.cc, command_model.cc, command_line.cc and
+// those that make the top of a program include its headers.
 //
 //   const Command group = top.addGroup("log", "Show submitted logs");
 //   const Command list = group.addCommand("list", "List the pending logs");

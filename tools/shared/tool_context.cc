@@ -1,31 +1,14 @@
 #include "tools/shared/tool_context.h"
 
-#include <nlohmann/json.hpp>
-#include <ostream>
 #include <stdexcept>
-#include <utility>
 
 #include "base/format.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/store/sqlite_store.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
-
-Json withFormatVersion(Json object) {
-  Json document = {{"format_version", kJsonFormatVersion}};
-  auto& members = document.get_ref<Json::object_t&>();
-  for (auto& [name, value] : object.get_ref<Json::object_t&>()) {
-    members.emplace_back(name, std::move(value));
-  }
-  return document;
-}
-
-std::string jsonText(const Json& value, int indent) {
-  return value.dump(indent, ' ', false, Json::error_handler_t::replace);
-}
 
 class ToolContext::NotingLog final : public SystemLog {
  public:
@@ -52,7 +35,7 @@ struct ToolContext::Services {
   SqliteStore store;
 };
 
-ToolContext::ToolContext(const ToolStreams& streams) : streams_(streams) {}
+ToolContext::ToolContext(const ToolStreams& streams) : ToolOutput("tavrelctl", streams) {}
 ToolContext::~ToolContext() = default;
 
 const DeviceRoot& ToolContext::root() {
@@ -86,33 +69,6 @@ FilePreferences& ToolContext::preferences() {
 
 SqliteStore& ToolContext::storeForReading() {
   return services().store;
-}
-
-void ToolContext::addJsonOption(Command command) {
-  command.addFlag("--json", json_, "Print JSON (format_version 1)");
-}
-
-void ToolContext::printJson(Json object) {
-  streams_.out << jsonText(withFormatVersion(std::move(object)), 2) << '\n';
-}
-
-void ToolContext::printLine(std::string_view message) {
-  streams_.out.flush();
-  streams_.error << "tavrelctl: " << printable(message) << '\n';
-}
-
-void ToolContext::fail(std::string_view message) {
-  printLine(message);
-  exitStatus_ = kExitFailure;
-}
-
-void ToolContext::failUsage(std::string_view message) {
-  printLine(message);
-  exitStatus_ = kExitUsage;
-}
-
-void ToolContext::note(std::string_view message) {
-  printLine(message);
 }
 
 }  // namespace tavrel

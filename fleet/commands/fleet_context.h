@@ -1,0 +1,34 @@
+// What each subcommand of tavrel-fleet gets: the database, and tools/shared/tool_output.h.
+//
+//   void addShowCommand(Command top, FleetContext& context) {
+//     const Command show = top.addCommand("show", "Show one statistic");
+//     ...
+//     show.onRun([&context, options] {
+//       const auto engine = context.openDatabase(OpenMode::kRead);
+//       ...
+//     });
+//   }
+#pragma once
+
+#include <memory>
+#include <string>
+
+#include "fleet/engine/open/open_engine.h"
+#include "tools/shared/tool_output.h"
+
+namespace tavrel::fleet {
+
+class FleetContext : public ToolOutput {
+ public:
+  explicit FleetContext(const ToolStreams& streams) : ToolOutput("tavrel-fleet", streams) {}
+
+  /// Where the tables are, as `--database` says.
+  std::string& database() { return database_; }
+  /// Throws EngineError, which `runFleet` turns into a failure.
+  std::unique_ptr<Engine> openDatabase(OpenMode mode) { return openEngine(database_, mode); }
+
+ private:
+  std::string database_ = "fleet.db";
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,47 @@
+#include "fleet/fleet_tool.h"
+
+#include <CLI/CLI.hpp>
+#include <exception>
+
+#include "base/version.h"
+#include "fleet/commands/load_command.h"
+#include "tools/shared/command_line.h"
+
+namespace tavrel::fleet {
+namespace {
+
+// In the order of the help.
+constexpr void (*kSubcommands[])(Command top, FleetContext& context) = {addLoadCommand};
+
+void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) {
+  app.fallthrough();
+  app.require_subcommand(1);
+  app.footer("--database may appear anywhere on the line. See tavrel-fleet(1).");
+  app.set_version_flag("--version", "tavrel-fleet " + std::string(version()));
+  top.addOption("--database", context.database(),
+                "File of the tables, or clickhouse://HOST:PORT/NAME")
+      .typeName("FILE")
+      .showDefault()
+      .check([](const std::string& where) { return where.empty() ? "names no file" : ""; });
+}
+
+}  // namespace
+
+int runFleet(const std::vector<std::string>& arguments, const ToolStreams& streams) {
+  FleetContext context(streams);
+  try {
+    CLI::App app("Files the logs of many devices in tables and answers questions about them.",
+                 "tavrel-fleet");
+    const Command top(app);
+    addGlobalOptions(app, top, context);
+    for (const auto add : kSubcommands)
+      add(top, context);
+    runCommandLine(app, arguments, context);
+  } catch (const std::exception& error) {
+    context.fail(error.what());
+  }
+  context.finish();
+  return context.exitStatus();
+}
+
+}  // namespace tavrel::fleet

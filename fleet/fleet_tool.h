@@ -1,0 +1,15 @@
+// The command line of tavrel-fleet, without the process around it.
+#pragma once
+
+#include <string>
+#include <vector>
+
+#include "fleet/commands/fleet_context.h"
+
+namespace tavrel::fleet {
+
+/// Runs one command line, without the program's name, and yields the exit status: 0 for success, 1
+/// for failure, 2 for wrong usage. Nothing is thrown.
+int runFleet(const std::vector<std::string>& arguments, const ToolStreams& streams);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,15 @@
+#include <cstdio>
+#include <exception>
+#include <string>
+#include <vector>
+
+#include "fleet/fleet_tool.h"
+
+int main(int argc, char** argv) try {
+  return tavrel::fleet::runFleet(std::vector<std::string>(argv + 1, argv + argc),
+                                 tavrel::standardStreams());
+} catch (const std::exception&) {
+  // What else goes wrong has been said; a message takes memory, of which there is none left.
+  std::fputs("tavrel-fleet: out of memory\n", stderr);
+  return 1;
+}

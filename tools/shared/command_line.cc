@@ -1,0 +1,42 @@
+#include "tools/shared/command_line.h"
+
+#include <CLI/CLI.hpp>
+
+#include "base/format.h"
+
+namespace tavrel {
+namespace {
+
+// What is wrong with a command line, and which subcommand's help to read.
+std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
+  const CLI::App* command = &app;
+  std::string line = app.get_name();
+  while (!command->get_subcommands().empty()) {
+    command = command->get_subcommands().front();
+    line += ' ' + command->get_name();
+  }
+  std::string fault = error.what();
+  const auto unknown = app.remaining(true);
+  if (dynamic_cast<const CLI::RequiredError*>(&error) != nullptr && !unknown.empty() &&
+      command->get_require_subcommand_min() > 0) {
+    const char* const what = unknown.front().starts_with('-') ? "option" : "subcommand";
+    fault = format("no %s '%s'", what, unknown.front());
+  }
+  return format("%s: see '%s --help'", fault, line);
+}
+
+}  // namespace
+
+void runCommandLine(CLI::App& app, const std::vector<std::string>& arguments, ToolOutput& output) {
+  try {
+    app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
+  } catch (const CLI::ParseError& error) {
+    if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
+      app.exit(error, output.out(), output.error());
+    } else {
+      output.failUsage(usageFault(app, error));
+    }
+  }
+}
+
+}  // namespace tavrel

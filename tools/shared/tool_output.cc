@@ -1,0 +1,86 @@
+#include "tools/shared/tool_output.h"
+
+#include <cstdlib>
+#include <iostream>
+#include <nlohmann/json.hpp>
+#include <sys/ioctl.h>
+#include <unistd.h>
+#include <utility>
+
+#include "tools/shared/table.h"
+
+namespace tavrel {
+namespace {
+
+// Nothing when standard output is not a terminal; a terminal of unknown width counts as 80 columns.
+std::optional<std::size_t> terminalColumns() {
+  if (!isatty(STDOUT_FILENO)) return std::nullopt;
+  winsize size{};
+  if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return 80;
+  return size.ws_col;
+}
+
+// NO_COLOR as no-color.org describes it.
+bool isColoured() {
+  if (!isatty(STDOUT_FILENO)) return false;
+  const char* const refusal = std::getenv("NO_COLOR");
+  const char* const terminal = std::getenv("TERM");
+  return (refusal == nullptr || *refusal == '\0') && terminal != nullptr &&
+         std::string_view(terminal) != "dumb";
+}
+
+}  // namespace
+
+Json withFormatVersion(Json object) {
+  Json document = {{"format_version", kJsonFormatVersion}};
+  auto& members = document.get_ref<Json::object_t&>();
+  for (auto& [name, value] : object.get_ref<Json::object_t&>()) {
+    members.emplace_back(name, std::move(value));
+  }
+  return document;
+}
+
+std::string jsonText(const Json& value, int indent) {
+  return value.dump(indent, ' ', false, Json::error_handler_t::replace);
+}
+
+ToolStreams standardStreams() {
+  std::ios::sync_with_stdio(false);
+  return {.in = std::cin,
+          .out = std::cout,
+          .error = std::cerr,
+          .columns = terminalColumns(),
+          .errorIsTerminal = isatty(STDERR_FILENO) == 1,
+          .inIsTerminal = isatty(STDIN_FILENO) == 1,
+          .outIsColoured = isColoured()};
+}
+
+void ToolOutput::addJsonOption(Command command) {
+  command.addFlag("--json", json_, "Print JSON (format_version 1)");
+}
+
+void ToolOutput::printJson(Json object) {
+  streams_.out << jsonText(withFormatVersion(std::move(object)), 2) << '\n';
+}
+
+void ToolOutput::note(std::string_view message) {
+  streams_.out.flush();
+  streams_.error << program_ << ": " << printable(message) << '\n';
+}
+
+void ToolOutput::fail(std::string_view message) {
+  note(message);
+  exitStatus_ = kExitFailure;
+}
+
+void ToolOutput::failUsage(std::string_view message) {
+  note(message);
+  exitStatus_ = kExitUsage;
+}
+
+void ToolOutput::finish() {
+  streams_.out.flush();
+  if (!streams_.out) fail("cannot write standard output: free space or check the pipe");
+}
+
+}  // namespace tavrel
