@@ -1,0 +1,395 @@
+#include "fleet/logs/log_builder.h"
+
+#include <cmath>
+#include <limits>
+
+#include "base/civil_time.h"
+#include "base/format.h"
+#include "fleet/logs/five_numbers_check.h"
+#include "fleet/logs/interval_label.h"
+#include "fleet/logs/limits.h"
+#include "fleet/logs/record_order.h"
+
+namespace tavrel::fleet {
+
+// Those up to `kHistograms` must be there.
+enum class LogBuilder::Member : std::uint8_t {
+  kVersion,
+  kStartDate,
+  kCreationDate,
+  kScalars,
+  kDistributions,
+  kHistograms,
+  kMetadata,
+  kTaskID,
+  kWhitelistDigest,
+  kApplications,
+  kUnknown
+};
+
+namespace {
+
+constexpr std::array<std::string_view, 10> kMembers = {
+    "BHCrashLogVersion", "BHStartDate",     "BHLogCreationDate",
+    "BHScalars",         "BHDistributions", "BHDistributionsHistogram",
+    "BHMetadata",        "BHTaskID",        "BHWhitelistDigest",
+    "BHActivatedAppInfo"};
+constexpr std::size_t kRequiredMembers = 6;
+
+constexpr std::size_t kShownBytes = 100;
+
+// The beginning of a long text.
+std::string_view shown(std::string_view text) {
+  return text.substr(0, kShownBytes);
+}
+
+bool isUnknown(std::string_view text) {
+  return text == "<unknown>" || text == "(no tasking id)";
+}
+
+std::int64_t wholeSeconds(plist::Date date) {
+  return static_cast<std::int64_t>(std::floor(date.secondsSince1970()));
+}
+
+bool isInCalendar(plist::Date date) {
+  const double days = date.secondsSince1970() / kSecondsPerDay;
+  return days >= limits::kFirstDay && days < limits::kLastDay + 1;
+}
+
+}  // namespace
+
+std::string LogBuilder::path() const {
+  if (levels_.empty()) return {};
+  std::string path(shown(memberName_));
+  const Place place = levels_.back().place;
+  if (place == Place::kRoot || place == Place::kSkipped) return path;
+  if (!entry_.empty()) path.append("/").append(shown(entry_));
+  if (!inner_.empty()) path.append("/").append(shown(inner_));
+  return path;
+}
+
+bool LogBuilder::fail(std::string_view reason) {
+  fault_ = path();
+  if (!fault_.empty()) fault_ += ": ";
+  fault_ += reason;
+  return false;
+}
+
+bool LogBuilder::wrongType(std::string_view wanted) {
+  return fail(format("is not %s", wanted));
+}
+
+bool LogBuilder::keepText(std::string_view text, std::string_view& to) {
+  if (text.size() > limits::kTextBytes) {
+    return fail(format("has more than %zu bytes", limits::kTextBytes));
+  }
+  if (!isUnknown(text)) to = record_.texts.keep(text);
+  return true;
+}
+
+bool LogBuilder::addRow() {
+  if (++rows_ <= limits::kLogRows) return true;
+  return fail(format("the log has more than %zu rows", limits::kLogRows));
+}
+
+// The place of a value in the grammar of property lists.
+bool LogBuilder::takeValue() {
+  if (levels_.empty()) {
+    if (hasDocument_) return fail("there is a second value");
+    hasDocument_ = true;
+    return true;
+  }
+  Level& level = levels_.back();
+  if (!level.isDictionary) return true;
+  if (!level.hasKey) return fail("a dictionary has a value without a key");
+  level.hasKey = false;
+  return true;
+}
+
+bool LogBuilder::key(std::string_view text) {
+  if (levels_.empty() || !levels_.back().isDictionary) {
+    return fail("a key is outside of a dictionary");
+  }
+  Level& level = levels_.back();
+  if (level.hasKey) return fail("a key has no value");
+  level.hasKey = true;
+  if (level.place == Place::kSkipped) return true;
+  if (text.size() > limits::kTextBytes) {
+    return fail(format("a key has more than %zu bytes", limits::kTextBytes));
+  }
+  switch (level.place) {
+    case Place::kRoot: {
+      memberName_ = record_.texts.keep(text);
+      std::uint8_t number = 0;
+      while (number < kMembers.size() && kMembers[number] != text)
+        ++number;
+      member_ = static_cast<Member>(number);
+      if (member_ == Member::kUnknown) return true;
+      if ((seen_ >> number & 1U) != 0) return fail("is there twice");
+      seen_ |= 1U << number;
+      return true;
+    }
+    case Place::kScalars:
+    case Place::kDistributions:
+    case Place::kHistograms:
+      entry_ = record_.texts.keep(text);
+      return true;
+    default:
+      inner_ = record_.texts.keep(text);
+      return true;
+  }
+}
+
+bool LogBuilder::begin(bool isDictionary) {
+  if (!takeValue()) return false;
+  if (levels_.size() == limits::kDepth) {
+    return fail(format("containers nest deeper than %zu", limits::kDepth));
+  }
+  Place inner = Place::kSkipped;
+  if (!beginIn(isDictionary, inner)) return false;
+  levels_.push_back({inner, isDictionary});
+  return true;
+}
+
+bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
+  if (levels_.empty()) {
+    inner = Place::kRoot;
+    return isDictionary || fail("is not a tallied log: it is an array");
+  }
+  const auto dictionary = [&](Place place) {
+    inner = place;
+    return isDictionary || wrongType("a dictionary");
+  };
+  switch (levels_.back().place) {
+    case Place::kRoot:
+      entry_ = inner_ = {};
+      switch (member_) {
+        case Member::kMetadata:
+          return dictionary(Place::kMetadata);
+        case Member::kScalars:
+          return dictionary(Place::kScalars);
+        case Member::kDistributions:
+          return dictionary(Place::kDistributions);
+        case Member::kHistograms:
+          return dictionary(Place::kHistograms);
+        case Member::kApplications:
+          inner = Place::kApplications;
+          return !isDictionary || wrongType("an array");
+        case Member::kTaskID:
+        case Member::kUnknown:
+          return true;
+        default:
+          return wrongType("what a tallied log has there");
+      }
+    case Place::kDistributions:
+      inner = Place::kNumbers;
+      numberCount_ = 0;
+      return !isDictionary || wrongType("an array of five numbers");
+    case Place::kHistograms:
+      inner_ = {};
+      return dictionary(Place::kCells);
+    case Place::kApplications:
+      if (!addRow()) return false;
+      record_.applications.emplace_back();
+      return dictionary(Place::kApplication);
+    case Place::kScalars:
+      return wrongType("an integer");
+    case Place::kNumbers:
+    case Place::kCells:
+      return wrongType("a number");
+    default:
+      return true;
+  }
+}
+
+bool LogBuilder::end() {
+  const Level level = levels_.back();
+  if (level.hasKey) return fail("the last key of a dictionary has no value");
+  if (level.place == Place::kNumbers && !endNumbers()) return false;
+  levels_.pop_back();
+  inner_ = {};
+  if (level.place != Place::kNumbers && level.place != Place::kCells) entry_ = {};
+  return true;
+}
+
+bool LogBuilder::endNumbers() {
+  if (numberCount_ != 5) return wrongType("an array of five numbers");
+  const FiveNumbers numbers = {numbers_[0], numbers_[1], numbers_[2], numbers_[3], count_};
+  if (const char* const fault = faultOf(numbers)) return fail(fault);
+  if (!addRow()) return false;
+  record_.distributions.push_back({entry_, numbers});
+  return true;
+}
+
+bool LogBuilder::addNumber(double number) {
+  if (numberCount_ >= 4) {
+    return wrongType(numberCount_ == 4 ? "a summary whose count is an integer"
+                                       : "an array of five numbers");
+  }
+  // One of the many forms of not-a-number, so that equal logs have equal bits.
+  numbers_[numberCount_++] = std::isnan(number) ? std::numeric_limits<double>::quiet_NaN() : number;
+  return true;
+}
+
+bool LogBuilder::addCell(const plist::Number& count) {
+  const auto interval = parseIntervalLabel(inner_);
+  if (!interval) return fail("the label is not an interval");
+  if (count.kind() == plist::NumberKind::UInt64 || count.int64() < 0) {
+    return fail("the count is not one of values");
+  }
+  if (!addRow()) return false;
+  record_.cells.push_back({entry_, interval->lower, interval->upper, inner_,
+                           static_cast<std::uint64_t>(count.int64())});
+  return true;
+}
+
+bool LogBuilder::rootInteger(const plist::Number& number) {
+  switch (member_) {
+    case Member::kVersion:
+      if (number.kind() != plist::NumberKind::UInt64 && number.int64() == 1) return true;
+      return fail("is a version that this program does not know");
+    case Member::kTaskID:
+    case Member::kUnknown:
+      return true;
+    default:
+      return wrongType("what a tallied log has there");
+  }
+}
+
+bool LogBuilder::integer(const plist::Number& number) {
+  if (!takeValue()) return false;
+  if (levels_.empty()) return fail("is not a tallied log: it is a number");
+  const bool isLarge = number.kind() == plist::NumberKind::UInt64;
+  switch (levels_.back().place) {
+    case Place::kRoot:
+      return rootInteger(number);
+    case Place::kScalars:
+      if (isLarge) return fail("exceeds 64 bits with a sign");
+      if (!addRow()) return false;
+      record_.scalars.push_back({entry_, number.int64()});
+      return true;
+    case Place::kNumbers:
+      if (numberCount_ != 4) return addNumber(number.real());
+      if (isLarge || number.int64() < 0) return fail("its count is not one of values");
+      count_ = static_cast<std::uint64_t>(number.int64());
+      ++numberCount_;
+      return true;
+    case Place::kCells:
+      return addCell(number);
+    case Place::kApplication:
+      if (inner_ == "orboID") record_.applications.back().orboID = number.int64();
+      if (inner_ == "arch") record_.applications.back().arch = number.int64();
+      return true;
+    case Place::kDistributions:
+      return wrongType("an array of five numbers");
+    case Place::kHistograms:
+    case Place::kApplications:
+      return wrongType("a dictionary");
+    default:
+      return true;
+  }
+}
+
+bool LogBuilder::real(double number) {
+  if (!takeValue()) return false;
+  if (levels_.empty()) return fail("is not a tallied log: it is a number");
+  switch (levels_.back().place) {
+    case Place::kNumbers:
+      return addNumber(number);
+    case Place::kSkipped:
+      return true;
+    case Place::kRoot:
+      if (member_ == Member::kTaskID || member_ == Member::kUnknown) return true;
+      [[fallthrough]];
+    default:
+      return wrongType("what a tallied log has there");
+  }
+}
+
+bool LogBuilder::rootString(std::string_view text) {
+  switch (member_) {
+    case Member::kTaskID:
+      return keepText(text, record_.taskID);
+    case Member::kWhitelistDigest:
+      return keepText(text, record_.whitelistDigest);
+    case Member::kUnknown:
+      return true;
+    default:
+      return wrongType("what a tallied log has there");
+  }
+}
+
+bool LogBuilder::string(std::string_view text) {
+  if (!takeValue()) return false;
+  if (levels_.empty()) return fail("is not a tallied log: it is a text");
+  switch (levels_.back().place) {
+    case Place::kRoot:
+      return rootString(text);
+    case Place::kMetadata:
+      if (inner_ == "BHUserInterfaceLanguage") return keepText(text, record_.language);
+      if (inner_ == "BHPreferredUserInterfaceLanguage") {
+        return keepText(text, record_.preferredLanguage);
+      }
+      return inner_ != "BHUserSetRegionFormat" || keepText(text, record_.region);
+    case Place::kApplication: {
+      ApplicationRow& application = record_.applications.back();
+      if (inner_ == "bundle") return keepText(text, application.bundle);
+      if (inner_ == "version") return keepText(text, application.version);
+      return inner_ != "uuid" || keepText(text, application.uuid);
+    }
+    case Place::kSkipped:
+      return true;
+    default:
+      return wrongType("what a tallied log has there");
+  }
+}
+
+bool LogBuilder::date(plist::Date date) {
+  if (!takeValue()) return false;
+  if (levels_.empty()) return fail("is not a tallied log: it is a date");
+  const Place place = levels_.back().place;
+  if (place == Place::kSkipped || (place == Place::kRoot && member_ == Member::kUnknown)) {
+    return true;
+  }
+  if (place != Place::kRoot ||
+      (member_ != Member::kStartDate && member_ != Member::kCreationDate)) {
+    return wrongType("what a tallied log has there");
+  }
+  if (!isInCalendar(date)) return fail("is not within the years 2000 to 2099");
+  const std::int64_t seconds = wholeSeconds(date);
+  if (member_ == Member::kCreationDate) {
+    record_.created = seconds;
+    return true;
+  }
+  if (seconds % kSecondsPerDay != 0) return fail("is not the beginning of a day");
+  record_.day = static_cast<std::int32_t>(seconds / kSecondsPerDay);
+  return true;
+}
+
+bool LogBuilder::other() {
+  if (!takeValue()) return false;
+  if (levels_.empty()) return fail("is not a tallied log: it is a single value");
+  const Place place = levels_.back().place;
+  if (place == Place::kSkipped ||
+      (place == Place::kRoot && (member_ == Member::kTaskID || member_ == Member::kUnknown))) {
+    return true;
+  }
+  return wrongType("what a tallied log has there");
+}
+
+bool LogBuilder::finish() {
+  for (std::size_t number = 0; number < kRequiredMembers; ++number) {
+    if ((seen_ >> number & 1U) == 0) {
+      fault_ = format("is not a tallied log: it has no %s", kMembers[number]);
+      return false;
+    }
+  }
+  if (record_.created < std::int64_t{record_.day} * kSecondsPerDay) {
+    fault_ = "BHLogCreationDate: is before the day that the log reports";
+    return false;
+  }
+  fault_ = putInOrder(record_);
+  return fault_.empty();
+}
+
+}  // namespace tavrel::fleet

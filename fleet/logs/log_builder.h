@@ -1,0 +1,91 @@
+// Makes a record of a log from the events of a property-list reader, in one pass.
+//
+//   LogBuilder builder(record);
+//   builder.begin(true); builder.key("BHScalars"); ... builder.end();
+//   if (!builder.finish()) refuse(builder.fault());
+//
+// Every operation yields false when the log is refused; `fault` has the reason, and nothing else
+// may be called. Texts are copied.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/plist.h"
+#include "fleet/model/log_record.h"
+
+namespace tavrel::fleet {
+
+class LogBuilder {
+ public:
+  /// Fills `record`, which is empty.
+  explicit LogBuilder(LogRecord& record) : record_(record) {}
+
+  bool begin(bool isDictionary);
+  bool end();
+  bool key(std::string_view text);
+  bool string(std::string_view text);
+  bool integer(const plist::Number& number);
+  bool real(double number);
+  bool date(plist::Date date);
+  /// A boolean or data: no entry that is read has one.
+  bool other();
+
+  /// After the last event.
+  bool finish();
+
+  /// Refuses the log for what is at the place that is read now.
+  bool fail(std::string_view reason);
+  const std::string& fault() const { return fault_; }
+
+ private:
+  enum class Place : std::uint8_t {
+    kRoot,
+    kMetadata,
+    kScalars,
+    kDistributions,
+    kNumbers,
+    kHistograms,
+    kCells,
+    kApplications,
+    kApplication,
+    kSkipped
+  };
+  struct Level {
+    Place place;
+    bool isDictionary;
+    bool hasKey = false;
+  };
+  enum class Member : std::uint8_t;
+
+  bool takeValue();
+  bool beginIn(bool isDictionary, Place& inner);
+  bool endNumbers();
+  bool addRow();
+  bool addCell(const plist::Number& count);
+  bool addNumber(double number);
+  bool rootInteger(const plist::Number& number);
+  bool rootString(std::string_view text);
+  bool wrongType(std::string_view wanted);
+  bool keepText(std::string_view text, std::string_view& to);
+  std::string path() const;
+
+  LogRecord& record_;
+  std::vector<Level> levels_;
+  bool hasDocument_ = false;
+  std::uint32_t seen_ = 0;  // members of the root, by their numbers
+  Member member_{};
+  std::string_view memberName_;
+  std::string_view entry_;  // of a section; in the record's texts
+  std::string_view inner_;  // the key inside an entry or an application; valid until its value
+  std::array<double, 4> numbers_{};
+  std::uint64_t count_ = 0;
+  std::size_t numberCount_ = 0;
+  std::size_t rows_ = 0;
+  std::string fault_;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,97 @@
+#include "fleet/logs/log_metadata.h"
+
+#include "platform/plist/coding.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::string_view kTalliedType = "193";
+constexpr std::string_view kTalliedName = "log-tallied";
+constexpr std::string_view kNoVersion = "<unknown>";
+
+std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
+  const auto text = dictionary.get(key).string();
+  return text ? std::string(*text) : std::string();
+}
+
+void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
+  if (key == "ConfigNumber") metadata.configNumber = std::move(value);
+  // The first log of a device says that there was none before.
+  else if (key == "previous_os_version" && value != kNoVersion) {
+    metadata.previousOsVersion = std::move(value);
+  }
+}
+
+int hexDigit(char digit) {
+  if (digit >= '0' && digit <= '9') return digit - '0';
+  if (digit >= 'A' && digit <= 'F') return digit - 'A' + 10;
+  if (digit >= 'a' && digit <= 'f') return digit - 'a' + 10;
+  return -1;
+}
+
+// The log's name, when the file has the form of a submitted log: -YYYYMMDDTHHMMSSZ-XXXXXXXX.log
+std::string_view logNameOf(std::string_view fileName) {
+  constexpr std::string_view kForm = "-########T######Z-xxxxxxxx.log";
+  if (fileName.size() <= kForm.size()) return {};
+  const std::size_t at = fileName.size() - kForm.size();
+  for (std::size_t i = 0; i < kForm.size(); ++i) {
+    const char found = fileName[at + i];
+    const bool fits = kForm[i] == '#'   ? found >= '0' && found <= '9'
+                      : kForm[i] == 'x' ? hexDigit(found) >= 0
+                                        : found == kForm[i];
+    if (!fits) return {};
+  }
+  return fileName.substr(0, at);
+}
+
+}  // namespace
+
+Expected<LogMetadata> readMetadataFile(ByteSpan document) {
+  const auto value = plist::read(document);
+  if (!value) return value.error();
+  const plist::Dictionary dictionary = value->dictionary();
+  LogMetadata metadata;
+  metadata.logType = textOf(dictionary, "LogType");
+  metadata.osVersion = textOf(dictionary, "OSVersion");
+  const plist::Dictionary options = dictionary.dictionary("Options");
+  for (const std::string_view key : {"previous_os_version", "ConfigNumber"})
+    setOption(metadata, key, textOf(options, key));
+  return metadata;
+}
+
+std::string percentDecoded(std::string_view text) {
+  std::string decoded;
+  decoded.reserve(text.size());
+  for (std::size_t i = 0; i < text.size(); ++i) {
+    if (text[i] == '%' && i + 2 < text.size()) {
+      const int high = hexDigit(text[i + 1]);
+      const int low = hexDigit(text[i + 2]);
+      if (high >= 0 && low >= 0) {
+        decoded += static_cast<char>(high * 16 + low);
+        i += 2;
+        continue;
+      }
+    }
+    decoded += text[i];
+  }
+  return decoded;
+}
+
+void readOptions(std::string_view options, LogMetadata& metadata) {
+  while (!options.empty()) {
+    const std::string_view option = options.substr(0, options.find('&'));
+    options.remove_prefix(std::min(option.size() + 1, options.size()));
+    const std::size_t equals = option.find('=');
+    if (equals == std::string_view::npos) continue;
+    setOption(metadata, percentDecoded(option.substr(0, equals)),
+              percentDecoded(option.substr(equals + 1)));
+  }
+}
+
+bool isOtherLog(std::string_view fileName, const LogMetadata* metadata) {
+  if (metadata != nullptr && !metadata->logType.empty()) return metadata->logType != kTalliedType;
+  const std::string_view name = logNameOf(fileName);
+  return !name.empty() && name != kTalliedName;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,36 @@
+// Reads submitted logs: XML or binary property lists, as they are or in gzip's form.
+//
+//   LogReader reader;
+//   auto record = reader.read(bytes, &metadata);
+//   if (!record) std::cerr << path << ": " << record.error().message;
+#pragma once
+
+#include <string>
+
+#include "base/bytes.h"
+#include "base/expected.h"
+#include "fleet/logs/expat_xml.h"
+#include "fleet/logs/log_metadata.h"
+#include "fleet/model/log_record.h"
+
+namespace tavrel::fleet {
+
+/// One object reads one log after the other, in one thread.
+class LogReader {
+ public:
+  /// The error is the reason for which the log is refused, on one line without the file's name.
+  /// Without metadata the versions are not known.
+  Expected<LogRecord> read(ByteSpan bytes, const LogMetadata* metadata);
+
+ private:
+  std::string readDocument(ByteSpan document, LogRecord& record);
+
+  ExpatXml xml_;
+  std::string expanded_;
+  // Of the last log, to make room for the next one.
+  std::size_t scalars_ = 0;
+  std::size_t distributions_ = 0;
+  std::size_t cells_ = 0;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,154 @@
+#include "fleet/logs/plain_xml.h"
+
+#include <array>
+#include <optional>
+#include <string>
+
+#include "fleet/logs/xml_value.h"
+
+namespace tavrel::fleet {
+namespace {
+
+// The characters of a text that stand for themselves.
+constexpr std::array<bool, 256> kPlainCharacters = [] {
+  std::array<bool, 256> plain{};
+  for (int character = 0x20; character < 0x7F; ++character)
+    plain[static_cast<std::size_t>(character)] = true;
+  plain['\t'] = plain['\n'] = true;
+  plain['<'] = plain['>'] = plain['&'] = false;
+  return plain;
+}();
+
+class Reader {
+ public:
+  Reader(std::string_view document, LogBuilder& builder) : rest_(document), builder_(builder) {}
+
+  PlainXml read() {
+    take("<?xml version=\"1.0\" encoding=\"UTF-8\"?>");
+    skipSpace();
+    if (!take("<plist version=\"1.0\">")) return PlainXml::kNotPlain;
+    do {
+      skipSpace();
+      if (!readElement()) return outcome_;
+    } while (!containers_.empty());
+    skipSpace();
+    if (!take("</plist>")) return PlainXml::kNotPlain;
+    skipSpace();
+    return rest_.empty() ? PlainXml::kRead : PlainXml::kNotPlain;
+  }
+
+ private:
+  bool take(std::string_view text) {
+    if (!rest_.starts_with(text)) return false;
+    rest_.remove_prefix(text.size());
+    return true;
+  }
+
+  void skipSpace() {
+    std::size_t size = 0;
+    while (size < rest_.size() &&
+           (rest_[size] == '\n' || rest_[size] == '\t' || rest_[size] == ' '))
+      ++size;
+    rest_.remove_prefix(size);
+  }
+
+  bool built(bool taken) {
+    if (!taken) outcome_ = PlainXml::kRefused;
+    return taken;
+  }
+
+  // One start tag with its text, or one end tag. False ends the reading.
+  bool readElement() {
+    if (rest_.size() < 2 || rest_[0] != '<') return false;
+    switch (rest_[1]) {
+      case '/':
+        return readEnd();
+      case 'k':
+        return take("<key>") && readValue(XmlValue::kKey, "</key>");
+      case 'i':
+        return take("<integer>") && readValue(XmlValue::kInteger, "</integer>");
+      case 'r':
+        return take("<real>") && readValue(XmlValue::kReal, "</real>");
+      case 's':
+        return take("<string>") && readValue(XmlValue::kString, "</string>");
+      case 'd':
+        if (take("<dict>")) return begin(true);
+        if (take("<dict/>")) return begin(true) && end();
+        if (take("<date>")) return readValue(XmlValue::kDate, "</date>");
+        return take("<data>") && readValue(XmlValue::kData, "</data>");
+      case 'a':
+        if (take("<array>")) return begin(false);
+        return take("<array/>") && begin(false) && end();
+      case 't':
+        return take("<true/>") && built(builder_.other());
+      case 'f':
+        return take("<false/>") && built(builder_.other());
+      default:
+        return false;
+    }
+  }
+
+  bool begin(bool isDictionary) {
+    containers_.push_back(isDictionary);
+    return built(builder_.begin(isDictionary));
+  }
+
+  bool end() {
+    containers_.pop_back();
+    return built(builder_.end());
+  }
+
+  bool readEnd() {
+    if (containers_.empty()) return false;
+    return take(containers_.back() ? "</dict>" : "</array>") && end();
+  }
+
+  bool readValue(XmlValue element, std::string_view endTag) {
+    const auto text = readText();
+    return text && take(endTag) && built(buildValue(builder_, element, *text));
+  }
+
+  // Up to the next tag; nothing when it is not plain.
+  std::optional<std::string_view> readText() {
+    std::size_t size = 0;
+    while (size < rest_.size() && kPlainCharacters[static_cast<unsigned char>(rest_[size])])
+      ++size;
+    const std::string_view text = rest_.substr(0, size);
+    rest_.remove_prefix(size);
+    return rest_.starts_with('&') ? readReferences(text) : text;
+  }
+
+  // The rest of a text that has characters of XML itself, written as references.
+  std::optional<std::string_view> readReferences(std::string_view beginning) {
+    unescaped_ = beginning;
+    while (!rest_.starts_with('<')) {
+      if (take("&lt;")) {
+        unescaped_ += '<';
+      } else if (take("&gt;")) {
+        unescaped_ += '>';
+      } else if (take("&amp;")) {
+        unescaped_ += '&';
+      } else if (!rest_.empty() && kPlainCharacters[static_cast<unsigned char>(rest_.front())]) {
+        unescaped_ += rest_.front();
+        rest_.remove_prefix(1);
+      } else {
+        return std::nullopt;
+      }
+    }
+    return unescaped_;
+  }
+
+  std::string_view rest_;
+  LogBuilder& builder_;
+  std::vector<bool> containers_;  // whether each is a dictionary
+  std::string unescaped_;
+  PlainXml outcome_ = PlainXml::kNotPlain;
+};
+
+}  // namespace
+
+PlainXml readPlainXml(std::string_view document, LogBuilder& builder) {
+  return Reader(document, builder).read();
+}
+
+}  // namespace tavrel::fleet
