@@ -1,25 +1,95 @@
 #include "fleet/commands/load_command.h"
 
 #include <memory>
-#include <vector>
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "base/format.h"
+#include "fleet/loading/load.h"
 
 namespace tavrel::fleet {
 namespace {
 
 struct LoadOptions {
-  std::vector<std::string> paths;
+  LoadRequest request;
+  std::string setAside;
 };
+
+// One line of a terminal that each new text replaces.
+class Progress {
+ public:
+  explicit Progress(FleetContext& context) : context_(context) {}
+  void show(const LoadCounts& counts) {
+    if (!context_.showsProgress()) return;
+    context_.error() << format("\r%zu loaded, %zu known, %zu refused", counts.loaded, counts.known,
+                               counts.refused)
+                     << std::flush;
+    isShown_ = true;
+  }
+  void clear() {
+    if (isShown_) context_.error() << "\r\x1b[K" << std::flush;
+    isShown_ = false;
+  }
+
+ private:
+  FleetContext& context_;
+  bool isShown_ = false;
+};
+
+void printCounts(FleetContext& context, const LoadCounts& counts) {
+  if (context.json()) {
+    return context.printJson({{"loaded", counts.loaded},
+                              {"known", counts.known},
+                              {"refused", counts.refused},
+                              {"others", counts.others}});
+  }
+  context.out() << format("%zu loaded, %zu known, %zu refused", counts.loaded, counts.known,
+                          counts.refused);
+  if (counts.others != 0) context.out() << format("; %zu of another kind", counts.others);
+  context.out() << '\n';
+}
+
+void load(FleetContext& context, const LoadOptions& options) {
+  Progress progress(context);
+  const LoadListener listener = {
+      .note =
+          [&](std::string_view line) {
+            progress.clear();
+            context.note(line);
+          },
+      .progress = [&](const LoadCounts& counts) { progress.show(counts); }};
+  const auto engine = context.openDatabase(OpenMode::kWrite);
+  LoadRequest request = options.request;
+  if (!options.setAside.empty()) request.setAside = options.setAside;
+  const auto counts = load(*engine, request, listener);
+  progress.clear();
+  if (!counts) return context.fail(counts.error().message);
+  printCounts(context, *counts);
+  if (counts->refused != 0) context.setExitStatus(kExitFailure);
+}
 
 }  // namespace
 
 void addLoadCommand(Command top, FleetContext& context) {
-  const Command load = top.addCommand("load", "File logs in the tables");
+  const Command command = top.addCommand("load", "File logs in the tables");
   auto options = std::make_shared<LoadOptions>();
-  load.addOption("PATH", options->paths, "Files, folders or archives").typeName("FILE").required();
-  load.onRun([&context, options] {
-    context.openDatabase(OpenMode::kWrite);
-    context.fail("cannot read logs: this program does not know how yet");
-  });
+  command.addOption("PATH", options->request.paths, "Logs, folders with logs, tar archives")
+      .typeName("FILE")
+      .required();
+  command
+      .addOption("--metadata", options->request.uploadLines,
+                 "Lines of JSON in which a server notes the metadata of uploads")
+      .typeName("FILE");
+  command
+      .addOption("--whitelist", options->request.whitelists,
+                 "Refuse logs with keys that this whitelist, known by its digest, does not name")
+      .typeName("FILE");
+  command
+      .addOption("--set-aside", options->setAside, "Folder for copies of refused logs with reasons")
+      .typeName("DIR");
+  context.addJsonOption(command);
+  command.setFooter("The exit status is 1 when a log was refused; all others are loaded.");
+  command.onRun([&context, options] { load(context, *options); });
 }
 
 }  // namespace tavrel::fleet

@@ -56,6 +56,7 @@ Expected<LogRecord> LogReader::read(ByteSpan bytes, const LogMetadata* metadata)
     if (const Status done = gunzip(bytes, limits::kLogBytes, expanded_); !done) return done.error();
     bytes = asBytes(expanded_);
   }
+  documentBytes_ = bytes.size();
   if (bytes.size() > limits::kLogBytes) {
     return Error{format("has more than %zu bytes", limits::kLogBytes)};
   }

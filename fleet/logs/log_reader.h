@@ -21,12 +21,15 @@ class LogReader {
   /// The error is the reason for which the log is refused, on one line without the file's name.
   /// Without metadata the versions are not known.
   Expected<LogRecord> read(ByteSpan bytes, const LogMetadata* metadata);
+  /// Of the last log, expanded.
+  std::size_t documentBytes() const { return documentBytes_; }
 
  private:
   std::string readDocument(ByteSpan document, LogRecord& record);
 
   ExpatXml xml_;
   std::string expanded_;
+  std::size_t documentBytes_ = 0;
   // Of the last log, to make room for the next one.
   std::size_t scalars_ = 0;
   std::size_t distributions_ = 0;

@@ -61,7 +61,10 @@ Command Command::addChoice(const char* heading) const {
 
 template <class Target>
 Option Command::addOption(const char* names, Target& target, const char* description) const {
-  return Option(*app_->add_option(names, target, description));
+  CLI::Option* const option = app_->add_option(names, target, description);
+  // One value for each time that the option is given; what follows are arguments.
+  if (names[0] == '-') option->allow_extra_args(false);
+  return Option(*option);
 }
 template Option Command::addOption(const char*, std::string&, const char*) const;
 template Option Command::addOption(const char*, double&, const char*) const;

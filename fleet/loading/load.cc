@@ -1,0 +1,99 @@
+#include "fleet/loading/load.h"
+
+#include <algorithm>
+#include <thread>
+#include <utility>
+
+#include "base/format.h"
+#include "fleet/loading/permitted_keys.h"
+#include "fleet/loading/reading_threads.h"
+#include "fleet/loading/set_aside.h"
+#include "fleet/sources/sources.h"
+
+namespace tavrel::fleet {
+namespace {
+
+// What the database takes in one step. More would hold up other loaders, less costs it time.
+constexpr std::size_t kBatchLogs = 1'000;
+constexpr std::size_t kBatchBytes = 64U << 20;
+
+class Loading {
+ public:
+  Loading(Engine& engine, const LoadRequest& request, const LoadListener& listener)
+      : engine_(engine), listener_(listener) {
+    if (request.setAside) setAside_.emplace(*request.setAside);
+  }
+
+  Status take(ReadItem item) {
+    if (item.record) {
+      batch_.push_back(*std::move(item.record));
+      batchBytes_ += item.bytes;
+      if (batch_.size() == kBatchLogs || batchBytes_ >= kBatchBytes) file();
+      return Done{};
+    }
+    if (item.source.kind == SourceItem::Kind::kOther) {
+      ++counts_.others;
+      return Done{};
+    }
+    const bool isRefused = item.source.kind == SourceItem::Kind::kRefused;
+    listener_.note(format("%s: %s: %s", isRefused ? "refused" : "skipped", item.source.name,
+                          item.source.reason));
+    if (!isRefused) return Done{};
+    ++counts_.refused;
+    return setAside_ ? setAside_->keep(item.source) : Done{};
+  }
+
+  LoadCounts finish() {
+    file();
+    return counts_;
+  }
+
+ private:
+  void file() {
+    if (batch_.empty()) return;
+    const Engine::Appended appended = engine_.append(batch_);
+    counts_.loaded += appended.added;
+    counts_.known += appended.known;
+    batch_.clear();
+    batchBytes_ = 0;
+    listener_.progress(counts_);
+  }
+
+  Engine& engine_;
+  const LoadListener& listener_;
+  std::optional<SetAside> setAside_;
+  std::vector<LogRecord> batch_;
+  std::size_t batchBytes_ = 0;
+  LoadCounts counts_;
+};
+
+}  // namespace
+
+Expected<LoadCounts> load(Engine& engine, const LoadRequest& request,
+                          const LoadListener& listener) {
+  PermittedKeys permitted;
+  for (const std::string& path : request.whitelists) {
+    if (const Status added = permitted.add(path); !added) return added.error();
+  }
+  UploadLines lines;
+  for (const std::string& path : request.uploadLines) {
+    const auto useless = lines.read(path);
+    if (!useless) return useless.error();
+    if (*useless != 0) {
+      listener.note(format("%s: %zu lines tell of no log that has arrived", path, *useless));
+    }
+  }
+  Loading loading(engine, request, listener);
+  ReadingThreads reading(
+      [&](const SourceSink& sink) {
+        for (const std::string& path : request.paths)
+          visitSources(path, lines, sink);
+      },
+      permitted, std::max(1U, std::thread::hardware_concurrency()));
+  while (auto item = reading.next()) {
+    if (const Status taken = loading.take(*std::move(item)); !taken) return taken.error();
+  }
+  return loading.finish();
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,40 @@
+// Files the logs of many places in the tables.
+#pragma once
+
+#include <cstddef>
+#include <functional>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "base/expected.h"
+#include "fleet/engine/engine.h"
+
+namespace tavrel::fleet {
+
+struct LoadRequest {
+  std::vector<std::string> paths;
+  std::vector<std::string> uploadLines;  // files with the metadata of a server's uploads
+  std::vector<std::string> whitelists;   // all keys are permitted when there are none
+  std::optional<std::string> setAside;   // folder for copies of refused logs
+};
+
+struct LoadCounts {
+  std::size_t loaded = 0;
+  std::size_t known = 0;  // were in the tables before, or came twice
+  std::size_t refused = 0;
+  std::size_t others = 0;  // logs of another kind
+};
+
+struct LoadListener {
+  /// Lines about what was refused and skipped, in the order in which it was found.
+  std::function<void(std::string_view line)> note;
+  std::function<void(const LoadCounts& counts)> progress;
+};
+
+/// Fails when what the request names for itself cannot be read, or a refused log cannot be set
+/// aside. Throws EngineError. What was filed before a failure stays filed.
+Expected<LoadCounts> load(Engine& engine, const LoadRequest& request, const LoadListener& listener);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,23 @@
+// From what was found to a record, or to why there is none.
+#pragma once
+
+#include <optional>
+#include <string>
+
+#include "fleet/loading/permitted_keys.h"
+#include "fleet/logs/log_reader.h"
+#include "fleet/sources/source_item.h"
+
+namespace tavrel::fleet {
+
+struct ReadItem {
+  /// `kFile` and `kContent` when it was read; a refused item keeps its path or content.
+  SourceItem source;
+  std::optional<LogRecord> record;
+  std::size_t bytes = 0;  // of the document that was read
+};
+
+/// `permitted` may be without whitelists, and then permits everything.
+ReadItem readItem(SourceItem item, LogReader& reader, const PermittedKeys& permitted);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,123 @@
+#include "fleet/loading/reading_threads.h"
+
+#include <utility>
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::size_t kPieceItems = 8;
+constexpr std::size_t kPieceBytes = 1U << 20;
+
+// What may be found and read ahead of the database: pieces, and bytes of logs, whose records take
+// about as much memory.
+constexpr std::size_t kPiecesAhead = 256;
+constexpr std::size_t kBytesAhead = 192U << 20;
+
+}  // namespace
+
+ReadingThreads::ReadingThreads(std::function<void(const SourceSink&)> find,
+                               const PermittedKeys& permitted, unsigned threads)
+    : permitted_(permitted) {
+  threads_.emplace_back([this, find = std::move(find)] { search(find); });
+  for (unsigned i = 0; i < threads; ++i)
+    threads_.emplace_back([this] { readPieces(); });
+}
+
+ReadingThreads::~ReadingThreads() {
+  {
+    const std::lock_guard lock(mutex_);
+    stopped_ = true;
+  }
+  changed_.notify_all();
+  for (std::thread& thread : threads_)
+    thread.join();
+}
+
+void ReadingThreads::noteFailure() {
+  const std::lock_guard lock(mutex_);
+  if (!failure_) failure_ = std::current_exception();
+}
+
+void ReadingThreads::queue(std::shared_ptr<Piece>& piece) {
+  if (piece->found.empty()) return;
+  std::unique_lock lock(mutex_);
+  changed_.wait(lock, [&] {
+    return stopped_ || order_.empty() || (order_.size() < kPiecesAhead && bytes_ < kBytesAhead);
+  });
+  if (stopped_) throw Stopped();
+  bytes_ += piece->bytes;
+  order_.push_back(piece);
+  waiting_.push_back(std::exchange(piece, std::make_shared<Piece>()));
+  changed_.notify_all();
+}
+
+void ReadingThreads::search(const std::function<void(const SourceSink&)>& find) {
+  try {
+    auto piece = std::make_shared<Piece>();
+    find([&](SourceItem item) {
+      piece->bytes += item.content.size();
+      piece->found.push_back(std::move(item));
+      if (piece->found.size() == kPieceItems || piece->bytes >= kPieceBytes) queue(piece);
+    });
+    queue(piece);
+  } catch (const Stopped&) {
+    return;
+  } catch (...) {
+    noteFailure();
+  }
+  const std::lock_guard lock(mutex_);
+  foundAll_ = true;
+  changed_.notify_all();
+}
+
+void ReadingThreads::readPieces() {
+  LogReader reader;
+  while (true) {
+    std::shared_ptr<Piece> piece;
+    {
+      std::unique_lock lock(mutex_);
+      changed_.wait(lock, [&] {
+        if (stopped_ || (foundAll_ && waiting_.empty())) return true;
+        if (waiting_.empty()) return false;
+        // The first one is what `next` waits for.
+        return bytes_ < kBytesAhead || waiting_.front() == order_.front();
+      });
+      if (stopped_ || waiting_.empty()) return;
+      piece = std::move(waiting_.front());
+      waiting_.pop_front();
+    }
+    std::size_t bytes = 0;
+    try {
+      for (SourceItem& item : piece->found) {
+        piece->read.push_back(readItem(std::move(item), reader, permitted_));
+        bytes += piece->read.back().bytes;
+      }
+    } catch (...) {
+      noteFailure();
+    }
+    piece->found.clear();
+    const std::lock_guard lock(mutex_);
+    bytes_ += bytes;
+    piece->bytes += bytes;
+    piece->isRead = true;
+    changed_.notify_all();
+  }
+}
+
+std::optional<ReadItem> ReadingThreads::next() {
+  while (!current_ || position_ == current_->read.size()) {
+    std::unique_lock lock(mutex_);
+    changed_.wait(
+        lock, [&] { return failure_ || (order_.empty() ? foundAll_ : order_.front()->isRead); });
+    if (failure_) std::rethrow_exception(failure_);
+    if (order_.empty()) return std::nullopt;
+    current_ = std::move(order_.front());
+    order_.pop_front();
+    bytes_ -= current_->bytes;
+    position_ = 0;
+    changed_.notify_all();
+  }
+  return std::move(current_->read[position_++]);
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,67 @@
+// Reads logs in several threads and hands them out in the order in which they were found.
+//
+//   ReadingThreads reading(find, permitted, 2);
+//   while (auto item = reading.next()) ...
+#pragma once
+
+#include <condition_variable>
+#include <cstddef>
+#include <deque>
+#include <exception>
+#include <functional>
+#include <memory>
+#include <mutex>
+#include <optional>
+#include <thread>
+#include <vector>
+
+#include "fleet/loading/read_item.h"
+
+namespace tavrel::fleet {
+
+class ReadingThreads {
+ public:
+  /// `find` runs in a thread of its own and gives what it finds to the sink. What it throws, `next`
+  /// throws.
+  ReadingThreads(std::function<void(const SourceSink&)> find, const PermittedKeys& permitted,
+                 unsigned threads);
+  ReadingThreads(const ReadingThreads&) = delete;
+  ReadingThreads& operator=(const ReadingThreads&) = delete;
+  /// Ends the search.
+  ~ReadingThreads();
+
+  /// Nothing at the end.
+  std::optional<ReadItem> next();
+
+ private:
+  struct Stopped {};
+  // Items that one thread reads in a row, so that threads seldom wait for each other.
+  struct Piece {
+    std::vector<SourceItem> found;
+    std::vector<ReadItem> read;
+    std::size_t bytes = 0;
+    bool isRead = false;
+  };
+
+  void search(const std::function<void(const SourceSink&)>& find);
+  void queue(std::shared_ptr<Piece>& piece);
+  void readPieces();
+  void noteFailure();
+
+  const PermittedKeys& permitted_;
+  std::mutex mutex_;
+  std::condition_variable changed_;
+  std::deque<std::shared_ptr<Piece>> order_;    // all that `next` has not taken
+  std::deque<std::shared_ptr<Piece>> waiting_;  // those of them that no thread reads yet
+  std::size_t bytes_ = 0;                       // of all in `order_`
+  bool foundAll_ = false;
+  bool stopped_ = false;
+  std::exception_ptr failure_;
+
+  std::shared_ptr<Piece> current_;  // what `next` hands out
+  std::size_t position_ = 0;
+
+  std::vector<std::thread> threads_;
+};
+
+}  // namespace tavrel::fleet

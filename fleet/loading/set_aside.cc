@@ -1,0 +1,52 @@
+#include "fleet/loading/set_aside.h"
+
+#include <algorithm>
+#include <string_view>
+#include <utility>
+
+#include "base/format.h"
+#include "base/text.h"
+#include "fleet/logs/limits.h"
+#include "fleet/logs/record_digest.h"
+#include "fleet/sources/file_name.h"
+#include "fleet/sources/sources.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr mode_t kMode = 0640;
+
+// A name of our own: what an archive calls its members may be anything.
+std::string safeName(std::string_view name) {
+  constexpr std::size_t kLongest = 150;
+  constexpr std::string_view kSafe =
+      "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789._-";
+  std::string safe(name.substr(0, kLongest));
+  std::ranges::replace_if(
+      safe, [&](char letter) { return kSafe.find(letter) == std::string_view::npos; }, '_');
+  return safe;
+}
+
+}  // namespace
+
+Status SetAside::keep(const SourceItem& refused) {
+  std::string bytes = refused.content;
+  if (bytes.empty() && !refused.path.empty()) {
+    if (auto read = readSourceFile(refused.path, limits::kLogBytes, refused.mayBeLink)) {
+      bytes = *std::move(read);
+    }
+  }
+  constexpr std::size_t kDigits = 16;
+  std::string digest;
+  // What cannot be read is told apart by where it is.
+  appendHex(digest, sha256Of(asBytes(bytes.empty() ? refused.name : bytes)));
+  const std::string path =
+      folder_ + '/' + digest.substr(0, kDigits) + '-' + safeName(fileNameOf(refused.name));
+  if (!bytes.empty()) {
+    if (Status done = files_.replace(path, asBytes(bytes), kMode); !done) return done;
+  }
+  const std::string reason = format("%s: %s\n", refused.name, refused.reason);
+  return files_.replace(path + ".reason", asBytes(reason), kMode);
+}
+
+}  // namespace tavrel::fleet

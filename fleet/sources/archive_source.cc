@@ -1,0 +1,157 @@
+#include "fleet/sources/archive_source.h"
+
+#include <archive.h>
+#include <archive_entry.h>
+#include <memory>
+#include <new>
+#include <unordered_map>
+#include <utility>
+
+#include "base/format.h"
+#include "fleet/logs/limits.h"
+#include "fleet/sources/file_name.h"
+#include "fleet/sources/limits.h"
+
+namespace tavrel::fleet {
+namespace {
+
+using Kind = SourceItem::Kind;
+
+class Archive {
+ public:
+  explicit Archive(const std::string& path) : archive_(archive_read_new()) {
+    if (!archive_) throw std::bad_alloc();
+    archive_read_support_format_tar(archive_.get());
+    archive_read_support_filter_gzip(archive_.get());
+    archive_read_support_filter_bzip2(archive_.get());
+    archive_read_support_filter_xz(archive_.get());
+    archive_read_support_filter_zstd(archive_.get());
+    archive_read_support_filter_lz4(archive_.get());
+    archive_read_support_filter_lzip(archive_.get());
+    constexpr std::size_t kBlock = 256U << 10;
+    if (archive_read_open_filename(archive_.get(), path.c_str(), kBlock) != ARCHIVE_OK) note();
+  }
+
+  /// The next member; null at the end and after a failure.
+  archive_entry* next() {
+    if (!failure_.empty()) return nullptr;
+    archive_entry* entry = nullptr;
+    const int code = archive_read_next_header(archive_.get(), &entry);
+    if (code == ARCHIVE_EOF) return nullptr;
+    if (code != ARCHIVE_OK && code != ARCHIVE_WARN) return note(), nullptr;
+    const std::int64_t expanded = archive_filter_bytes(archive_.get(), 0);
+    const std::int64_t read = archive_filter_bytes(archive_.get(), -1);
+    if (expanded - limits::kArchiveFreeBytes > limits::kArchiveRatio * read) {
+      failure_ = format("expands to more than %lld times its size", limits::kArchiveRatio);
+      return nullptr;
+    }
+    return entry;
+  }
+
+  /// The content of the member. False when it is longer than the limit, or after a failure.
+  bool read(std::size_t limit, std::string& content) {
+    content.clear();
+    const void* block = nullptr;
+    std::size_t size = 0;
+    la_int64_t offset = 0;
+    int code = ARCHIVE_OK;
+    while ((code = archive_read_data_block(archive_.get(), &block, &size, &offset)) == ARCHIVE_OK) {
+      const auto at = static_cast<std::uint64_t>(offset);
+      if (at + size > limit) return false;
+      // Sparse members have holes.
+      content.resize(static_cast<std::size_t>(at));
+      content.append(static_cast<const char*>(block), size);
+    }
+    if (code != ARCHIVE_EOF) note();
+    return code == ARCHIVE_EOF;
+  }
+
+  const std::string& failure() const { return failure_; }
+
+ private:
+  void note() {
+    const char* const words = archive_error_string(archive_.get());
+    failure_ = format("cannot be read on: %s", words != nullptr ? words : "it is damaged");
+  }
+
+  struct Free {
+    void operator()(archive* opened) const { archive_read_free(opened); }
+  };
+  std::unique_ptr<archive, Free> archive_;
+  std::string failure_;
+};
+
+std::string_view nameOf(archive_entry* entry) {
+  const char* const name = archive_entry_pathname(entry);
+  return name != nullptr ? name : "";
+}
+
+bool isFile(archive_entry* entry) {
+  return archive_entry_filetype(entry) == AE_IFREG && archive_entry_hardlink(entry) == nullptr;
+}
+
+using Sidecars = std::unordered_map<std::string, LogMetadata>;
+
+Sidecars readSidecars(const std::string& path) {
+  Sidecars sidecars;
+  Archive archive(path);
+  std::string content;
+  while (archive_entry* const entry = archive.next()) {
+    const std::string name(nameOf(entry));
+    if (!isFile(entry) || !isMetadataName(name)) continue;
+    if (!archive.read(limits::kMetadataBytes, content)) continue;
+    if (auto metadata = readMetadataFile(asBytes(content))) {
+      sidecars.insert_or_assign(name, *std::move(metadata));
+    }
+  }
+  return sidecars;
+}
+
+std::optional<LogMetadata> metadataOf(const std::string& name, const Sidecars& sidecars,
+                                      const UploadLines& lines) {
+  const auto sidecar = sidecars.find(sidecarOf(name));
+  if (sidecar != sidecars.end()) return sidecar->second;
+  const LogMetadata* const line = lines.find(folderNameOf(name), withoutGzip(fileNameOf(name)));
+  return line != nullptr ? std::optional(*line) : std::nullopt;
+}
+
+}  // namespace
+
+void visitArchive(const std::string& path, const UploadLines& lines, const SourceSink& sink) {
+  const Sidecars sidecars = readSidecars(path);
+  Archive archive(path);
+  while (archive_entry* const entry = archive.next()) {
+    const std::string name(nameOf(entry));
+    if (archive_entry_filetype(entry) == AE_IFDIR || !isLogName(fileNameOf(name))) continue;
+    SourceItem item;
+    item.name = format("%s: %s", path, name);
+    if (!isFile(entry)) {
+      item.kind = Kind::kSkipped;
+      item.reason = "is not a regular file";
+      sink(std::move(item));
+      continue;
+    }
+    item.metadata = metadataOf(name, sidecars, lines);
+    if (isOtherLog(withoutGzip(fileNameOf(name)), item.metadata ? &*item.metadata : nullptr)) {
+      item.kind = Kind::kOther;
+    } else if (archive.read(limits::kLogBytes, item.content)) {
+      item.kind = Kind::kContent;
+    } else if (archive.failure().empty()) {
+      item.kind = Kind::kRefused;
+      item.content.clear();
+      item.reason = format("has more than %zu bytes", limits::kLogBytes);
+    } else {
+      break;
+    }
+    sink(std::move(item));
+  }
+  if (!archive.failure().empty()) {
+    SourceItem item;
+    item.kind = Kind::kRefused;
+    item.name = path;
+    item.reason = archive.failure();
+    sink(std::move(item));
+  }
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,52 @@
+#include "fleet/sources/file_name.h"
+
+#include <algorithm>
+#include <array>
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr std::string_view kMetadataEnding = ".metadata.plist";
+constexpr std::string_view kGzipEnding = ".gz";
+constexpr std::array<std::string_view, 11> kArchiveEndings = {
+    ".tar", ".tar.gz",  ".tgz",  ".tar.bz2", ".tbz2",  ".tar.xz",
+    ".txz", ".tar.zst", ".tzst", ".tar.lz4", ".tar.lz"};
+
+}  // namespace
+
+bool isArchiveName(std::string_view name) {
+  return std::ranges::any_of(kArchiveEndings,
+                             [&](std::string_view ending) { return name.ends_with(ending); });
+}
+
+bool isMetadataName(std::string_view name) {
+  return name.ends_with(kMetadataEnding);
+}
+
+bool isLogName(std::string_view name) {
+  if (name.starts_with('.') || isMetadataName(name)) return false;
+  name = withoutGzip(name);
+  return name.ends_with(".log") || name.ends_with(".plist");
+}
+
+std::string_view withoutGzip(std::string_view name) {
+  if (name.ends_with(kGzipEnding)) name.remove_suffix(kGzipEnding.size());
+  return name;
+}
+
+std::string sidecarOf(std::string_view logPath) {
+  std::string_view name = withoutGzip(logPath);
+  name = name.substr(0, name.rfind('.'));
+  return std::string(name).append(kMetadataEnding);
+}
+
+std::string_view fileNameOf(std::string_view path) {
+  return path.substr(path.rfind('/') + 1);
+}
+
+std::string_view folderNameOf(std::string_view path) {
+  const std::size_t slash = path.rfind('/');
+  return slash == std::string_view::npos ? std::string_view() : fileNameOf(path.substr(0, slash));
+}
+
+}  // namespace tavrel::fleet

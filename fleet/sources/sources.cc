@@ -1,0 +1,184 @@
+#include "fleet/sources/sources.h"
+
+#include <algorithm>
+#include <cerrno>
+#include <cstring>
+#include <dirent.h>
+#include <fcntl.h>
+#include <memory>
+#include <sys/stat.h>
+#include <utility>
+#include <vector>
+
+#include "base/format.h"
+#include "fleet/logs/limits.h"
+#include "fleet/sources/archive_source.h"
+#include "fleet/sources/file_name.h"
+#include "fleet/sources/limits.h"
+#include "platform/linux/files/descriptor.h"
+
+namespace tavrel::fleet {
+namespace {
+
+using Kind = SourceItem::Kind;
+
+void give(const SourceSink& sink, Kind kind, std::string name, std::string reason) {
+  SourceItem item;
+  item.kind = kind;
+  item.name = std::move(name);
+  item.reason = std::move(reason);
+  sink(std::move(item));
+}
+
+// Of the system's last failure.
+std::string cannot(std::string_view what) {
+  return format("cannot be %s: %s", what, std::strerror(errno));
+}
+
+enum class FileType : std::uint8_t { kRegular, kFolder, kLink, kOther };
+
+FileType typeOf(mode_t mode) {
+  return S_ISREG(mode)   ? FileType::kRegular
+         : S_ISDIR(mode) ? FileType::kFolder
+         : S_ISLNK(mode) ? FileType::kLink
+                         : FileType::kOther;
+}
+
+FileType typeOf(int folder, const dirent& entry) {
+  switch (entry.d_type) {
+    case DT_REG:
+      return FileType::kRegular;
+    case DT_DIR:
+      return FileType::kFolder;
+    case DT_LNK:
+      return FileType::kLink;
+    case DT_UNKNOWN: {
+      struct stat status {};
+      if (fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0) {
+        return typeOf(status.st_mode);
+      }
+      return FileType::kOther;
+    }
+    default:
+      return FileType::kOther;
+  }
+}
+
+struct Entry {
+  std::string name;
+  FileType type;
+};
+
+class Visit {
+ public:
+  Visit(const UploadLines& lines, const SourceSink& sink) : lines_(lines), sink_(sink) {}
+
+  void folder(const std::string& path, Descriptor opened, std::size_t depth) {
+    struct Close {
+      void operator()(DIR* stream) const { closedir(stream); }
+    };
+    const std::unique_ptr<DIR, Close> stream(fdopendir(opened.get()));
+    if (!stream) return give(sink_, Kind::kRefused, path, cannot("listed"));
+    const int descriptor = opened.release();
+    std::vector<Entry> entries;
+    errno = 0;
+    while (const dirent* const entry = readdir(stream.get())) {
+      if (entry->d_name[0] != '.') entries.push_back({entry->d_name, typeOf(descriptor, *entry)});
+    }
+    if (errno != 0) give(sink_, Kind::kRefused, path, cannot("listed"));
+    std::ranges::sort(entries, {}, &Entry::name);
+    for (const Entry& entry : entries) {
+      const std::string inner = path.ends_with('/') ? path + entry.name : path + '/' + entry.name;
+      if (entry.type == FileType::kFolder) {
+        subfolder(descriptor, entry.name, inner, depth);
+      } else if (isArchiveName(entry.name)) {
+        if (isRegular(entry, inner)) visitArchive(inner, lines_, sink_);
+      } else if (isLogName(entry.name) && isRegular(entry, inner)) {
+        const bool hasSidecar =
+            std::ranges::binary_search(entries, sidecarOf(entry.name), {}, &Entry::name);
+        log(inner, hasSidecar, false);
+      }
+    }
+  }
+
+  void log(const std::string& path, bool hasSidecar, bool mayBeLink) {
+    SourceItem item;
+    item.mayBeLink = mayBeLink;
+    item.name = item.path = path;
+    item.hasSidecar = hasSidecar;
+    const std::string_view name = withoutGzip(fileNameOf(path));
+    const LogMetadata* const line = lines_.find(folderNameOf(path), name);
+    if (line != nullptr && !hasSidecar) item.metadata = *line;
+    // With a sidecar, its reader decides.
+    if (!hasSidecar && isOtherLog(name, line)) item.kind = Kind::kOther;
+    sink_(std::move(item));
+  }
+
+ private:
+  bool isRegular(const Entry& entry, const std::string& path) {
+    if (entry.type == FileType::kRegular) return true;
+    give(sink_, Kind::kSkipped, path,
+         entry.type == FileType::kLink ? "is a symbolic link" : "is not a regular file");
+    return false;
+  }
+
+  void subfolder(int parent, const std::string& name, const std::string& path, std::size_t depth) {
+    if (depth == limits::kFolderDepth) {
+      return give(sink_, Kind::kRefused, path,
+                  format("is nested in more than %zu folders", limits::kFolderDepth));
+    }
+    Descriptor opened(
+        openat(parent, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
+    if (!opened) return give(sink_, Kind::kRefused, path, cannot("opened"));
+    folder(path, std::move(opened), depth + 1);
+  }
+
+  const UploadLines& lines_;
+  const SourceSink& sink_;
+};
+
+}  // namespace
+
+void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink) {
+  struct stat status {};
+  if (stat(path.c_str(), &status) != 0) return give(sink, Kind::kRefused, path, cannot("found"));
+  Visit visit(lines, sink);
+  if (S_ISDIR(status.st_mode)) {
+    Descriptor opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+    if (!opened) return give(sink, Kind::kRefused, path, cannot("opened"));
+    visit.folder(path, std::move(opened), 0);
+  } else if (!S_ISREG(status.st_mode)) {
+    give(sink, Kind::kRefused, path, "is not a regular file");
+  } else if (isArchiveName(path)) {
+    visitArchive(path, lines, sink);
+  } else {
+    visit.log(path, access(sidecarOf(path).c_str(), F_OK) == 0, true);
+  }
+}
+
+Expected<std::string> readSourceFile(const std::string& path, std::size_t limit, bool mayBeLink) {
+  const Descriptor file(open(
+      path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY | (mayBeLink ? 0 : O_NOFOLLOW)));
+  if (!file) return Error{cannot("read")};
+  struct stat status {};
+  if (fstat(file.get(), &status) != 0) return Error{cannot("read")};
+  if (!S_ISREG(status.st_mode)) return Error{"is not a regular file"};
+  if (static_cast<std::uint64_t>(status.st_size) > limit) {
+    return Error{format("has more than %zu bytes", limit)};
+  }
+  // One byte more than it has shows that all was read.
+  std::string bytes(static_cast<std::size_t>(status.st_size) + 1, '\0');
+  std::size_t size = 0;
+  while (size < bytes.size()) {
+    const ssize_t got = read(file.get(), bytes.data() + size, bytes.size() - size);
+    if (got < 0 && errno == EINTR) continue;
+    if (got < 0) return Error{cannot("read")};
+    if (got == 0) break;
+    size += static_cast<std::size_t>(got);
+  }
+  if (size == bytes.size()) return Error{"grows while it is read"};
+  bytes.resize(size);
+  return bytes;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,21 @@
+// Finds logs: in files, folders, archives.
+#pragma once
+
+#include <string>
+
+#include "base/expected.h"
+#include "fleet/logs/log_metadata.h"
+#include "fleet/sources/source_item.h"
+#include "fleet/sources/upload_lines.h"
+
+namespace tavrel::fleet {
+
+/// Hands out what is at `path`, in the order of names: a folder with all below it, an archive, or a
+/// file, which is taken for a log whatever it is called. In folders, links are not followed.
+void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink);
+
+/// The bytes of a regular file of at most `limit` bytes. The error is the reason without the file's
+/// name.
+Expected<std::string> readSourceFile(const std::string& path, std::size_t limit, bool mayBeLink);
+
+}  // namespace tavrel::fleet
