@@ -75,8 +75,38 @@ bool LogBuilder::fail(std::string_view reason) {
   return false;
 }
 
-bool LogBuilder::wrongType(std::string_view wanted) {
-  return fail(format("is not %s", wanted));
+bool LogBuilder::wrongType() {
+  const auto wanted = [&] {
+    switch (levels_.back().place) {
+      case Place::kScalars:
+        return "an integer";
+      case Place::kDistributions:
+        return "an array of five numbers";
+      case Place::kNumbers:
+        return numberCount_ == 4 ? "a summary whose count is an integer"
+                                 : "an array of five numbers";
+      case Place::kCells:
+        return "an integer";
+      case Place::kRoot:
+        break;
+      default:
+        return "a dictionary";
+    }
+    switch (member_) {
+      case Member::kVersion:
+        return "an integer";
+      case Member::kStartDate:
+      case Member::kCreationDate:
+        return "a date";
+      case Member::kWhitelistDigest:
+        return "a text";
+      case Member::kApplications:
+        return "an array";
+      default:
+        return "a dictionary";
+    }
+  };
+  return fail(format("is not %s", wanted()));
 }
 
 bool LogBuilder::keepText(std::string_view text, std::string_view& to) {
@@ -101,7 +131,11 @@ bool LogBuilder::takeValue() {
   }
   Level& level = levels_.back();
   if (!level.isDictionary) return true;
-  if (!level.hasKey) return fail("a dictionary has a value without a key");
+  if (!level.hasKey) {
+    // The last place is not that of the value.
+    fault_ = "a dictionary has a value without a key";
+    return false;
+  }
   level.hasKey = false;
   return true;
 }
@@ -158,7 +192,7 @@ bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
   }
   const auto dictionary = [&](Place place) {
     inner = place;
-    return isDictionary || wrongType("a dictionary");
+    return isDictionary || wrongType();
   };
   switch (levels_.back().place) {
     case Place::kRoot:
@@ -174,17 +208,17 @@ bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
           return dictionary(Place::kHistograms);
         case Member::kApplications:
           inner = Place::kApplications;
-          return !isDictionary || wrongType("an array");
+          return !isDictionary || wrongType();
         case Member::kTaskID:
         case Member::kUnknown:
           return true;
         default:
-          return wrongType("what a tallied log has there");
+          return wrongType();
       }
     case Place::kDistributions:
       inner = Place::kNumbers;
       numberCount_ = 0;
-      return !isDictionary || wrongType("an array of five numbers");
+      return !isDictionary || wrongType();
     case Place::kHistograms:
       inner_ = {};
       return dictionary(Place::kCells);
@@ -193,10 +227,10 @@ bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
       record_.applications.emplace_back();
       return dictionary(Place::kApplication);
     case Place::kScalars:
-      return wrongType("an integer");
+      return wrongType();
     case Place::kNumbers:
     case Place::kCells:
-      return wrongType("a number");
+      return wrongType();
     default:
       return true;
   }
@@ -213,7 +247,7 @@ bool LogBuilder::end() {
 }
 
 bool LogBuilder::endNumbers() {
-  if (numberCount_ != 5) return wrongType("an array of five numbers");
+  if (numberCount_ != 5) return fail("is not an array of five numbers");
   const FiveNumbers numbers = {numbers_[0], numbers_[1], numbers_[2], numbers_[3], count_};
   if (const char* const fault = faultOf(numbers)) return fail(fault);
   if (!addRow()) return false;
@@ -223,8 +257,7 @@ bool LogBuilder::endNumbers() {
 
 bool LogBuilder::addNumber(double number) {
   if (numberCount_ >= 4) {
-    return wrongType(numberCount_ == 4 ? "a summary whose count is an integer"
-                                       : "an array of five numbers");
+    return wrongType();
   }
   // One of the many forms of not-a-number, so that equal logs have equal bits.
   numbers_[numberCount_++] = std::isnan(number) ? std::numeric_limits<double>::quiet_NaN() : number;
@@ -252,7 +285,7 @@ bool LogBuilder::rootInteger(const plist::Number& number) {
     case Member::kUnknown:
       return true;
     default:
-      return wrongType("what a tallied log has there");
+      return wrongType();
   }
 }
 
@@ -281,10 +314,10 @@ bool LogBuilder::integer(const plist::Number& number) {
       if (inner_ == "arch") record_.applications.back().arch = number.int64();
       return true;
     case Place::kDistributions:
-      return wrongType("an array of five numbers");
+      return wrongType();
     case Place::kHistograms:
     case Place::kApplications:
-      return wrongType("a dictionary");
+      return wrongType();
     default:
       return true;
   }
@@ -302,7 +335,7 @@ bool LogBuilder::real(double number) {
       if (member_ == Member::kTaskID || member_ == Member::kUnknown) return true;
       [[fallthrough]];
     default:
-      return wrongType("what a tallied log has there");
+      return wrongType();
   }
 }
 
@@ -315,7 +348,7 @@ bool LogBuilder::rootString(std::string_view text) {
     case Member::kUnknown:
       return true;
     default:
-      return wrongType("what a tallied log has there");
+      return wrongType();
   }
 }
 
@@ -340,7 +373,7 @@ bool LogBuilder::string(std::string_view text) {
     case Place::kSkipped:
       return true;
     default:
-      return wrongType("what a tallied log has there");
+      return wrongType();
   }
 }
 
@@ -353,7 +386,7 @@ bool LogBuilder::date(plist::Date date) {
   }
   if (place != Place::kRoot ||
       (member_ != Member::kStartDate && member_ != Member::kCreationDate)) {
-    return wrongType("what a tallied log has there");
+    return wrongType();
   }
   if (!isInCalendar(date)) return fail("is not within the years 2000 to 2099");
   const std::int64_t seconds = wholeSeconds(date);
@@ -374,7 +407,7 @@ bool LogBuilder::other() {
       (place == Place::kRoot && (member_ == Member::kTaskID || member_ == Member::kUnknown))) {
     return true;
   }
-  return wrongType("what a tallied log has there");
+  return wrongType();
 }
 
 bool LogBuilder::finish() {

@@ -69,7 +69,7 @@ class LogBuilder {
   bool addNumber(double number);
   bool rootInteger(const plist::Number& number);
   bool rootString(std::string_view text);
-  bool wrongType(std::string_view wanted);
+  bool wrongType();
   bool keepText(std::string_view text, std::string_view& to);
   std::string path() const;
 

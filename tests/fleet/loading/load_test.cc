@@ -1,0 +1,288 @@
+#include <csignal>
+#include <gtest/gtest.h>
+#include <set>
+#include <sqlite3.h>
+#include <sstream>
+#include <thread>
+
+#include "base/format.h"
+#include "base/text.h"
+#include "fleet/fleet_tool.h"
+#include "platform/linux/files/digests.h"
+#include "tests/fleet/loading/sample_log.h"
+#include "tests/platform/temporary_root.h"
+
+namespace tavrel::fleet {
+namespace {
+
+constexpr const char* kMetadata =
+    "<plist version=\"1.0\"><dict><key>LogType</key><string>193</string><key>OSVersion</key>"
+    "<string>Pellio 4.2 (16R349)</string><key>Options</key><dict><key>previous_os_version</key>"
+    "<string>Pellio 4.1 (16Q1)</string><key>ConfigNumber</key><string>CFG-7</string></dict></dict>"
+    "</plist>";
+constexpr const char* kOtherMetadata =
+    "<plist version=\"1.0\"><dict><key>LogType</key><string>165</string></dict></plist>";
+
+struct Outcome {
+  int status;
+  std::string out, error;
+};
+
+class LoadTest : public ::testing::Test {
+ protected:
+  std::string at(const std::string& path) const { return device_.root.path("/" + path); }
+  void write(const std::string& path, const std::string& content) const {
+    device_.write("/" + path, content);
+  }
+
+  Outcome run(std::vector<std::string> words) const {
+    words.insert(words.begin(), {"--database", at("fleet.db"), "load"});
+    std::istringstream in;
+    std::ostringstream out, error;
+    const int status = runFleet(words, {in, out, error});
+    return {status, out.str(), withoutFolder(error.str())};
+  }
+
+  std::string withoutFolder(std::string text) const {
+    const std::string folder = device_.root.path("/");
+    for (std::size_t found = 0; (found = text.find(folder)) != std::string::npos;)
+      text.erase(found, folder.size());
+    return text;
+  }
+
+  /// The rows that a statement yields, sorted, with '|' between columns.
+  std::multiset<std::string> rows(const char* statement) const {
+    sqlite3* database = nullptr;
+    EXPECT_EQ(sqlite3_open(at("fleet.db").c_str(), &database), SQLITE_OK);
+    std::multiset<std::string> found;
+    const auto take = [](void* rows, int count, char** texts, char**) {
+      std::string row;
+      for (int i = 0; i < count; ++i)
+        row.append(i == 0 ? "" : "|").append(texts[i] ? texts[i] : "");
+      static_cast<std::multiset<std::string>*>(rows)->insert(row);
+      return 0;
+    };
+    EXPECT_EQ(sqlite3_exec(database, statement, take, &found, nullptr), SQLITE_OK)
+        << sqlite3_errmsg(database);
+    sqlite3_close(database);
+    return found;
+  }
+  std::multiset<std::string> versions() const {
+    return rows(
+        "SELECT s.value, os_version, previous_os_version, config_number FROM logs l JOIN "
+        "scalars s USING (log) WHERE s.key = 'com.example.starts'");
+  }
+  std::multiset<std::string> everything() const {
+    std::multiset<std::string> all;
+    for (const char* const statement :
+         {"SELECT l.digest, l.day, s.key, s.value FROM logs l JOIN scalars s USING (log)",
+          "SELECT l.digest, d.key, d.mean, d.count FROM logs l JOIN distributions d USING (log)",
+          "SELECT l.digest, c.key, c.label, c.count FROM logs l JOIN cells c USING (log)",
+          "SELECT l.digest, a.bundle, a.uuid FROM logs l JOIN applications a USING (log)"}) {
+      all.merge(rows(statement));
+    }
+    return all;
+  }
+
+  pid_t startLoader(const std::string& folder) const {
+    const std::string database = at("fleet.db");
+    const pid_t child = fork();
+    if (child == 0) {
+      execl(TAVREL_FLEET, TAVREL_FLEET, "--database", database.c_str(), "load", folder.c_str(),
+            nullptr);
+      _exit(127);
+    }
+    return child;
+  }
+  void writeMany(int logs) const {
+    for (int i = 0; i < logs; ++i)
+      write(format("many/%d/x-%d.log", i % 7, i), sampleLog(i));
+  }
+
+  TemporaryRoot device_;
+};
+
+TEST_F(LoadTest, TakesAnOutbox) {
+  write("outbox/log-tallied-20261127T180218Z-5f0c9a1e.log", sampleLog(1));
+  write("outbox/log-tallied-20261127T180218Z-5f0c9a1e.metadata.plist", kMetadata);
+  write("outbox/log-tallied-20261128T180218Z-00000000.log", sampleLog(2));
+  write("outbox/StorageStatus-20261127T180218Z-5f0c9a1e.log", "flash");
+  write("outbox/StorageStatus-20261127T180218Z-5f0c9a1e.metadata.plist", kOtherMetadata);
+  write("outbox/StorageStatus-20261128T180218Z-5f0c9a1e.log", "flash without metadata");
+  write("outbox/.tavrel-0123456789012345.tmp", "unfinished");
+  const Outcome first = run({at("outbox")});
+  EXPECT_EQ(first.error, "");
+  EXPECT_EQ(first.out, "2 loaded, 0 known, 0 refused; 2 of another kind\n");
+  EXPECT_EQ(first.status, 0);
+  EXPECT_EQ(versions(),
+            (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
+  // The same logs under other names, and in another form.
+  write("again/a.log.gz", gzipped(sampleLog(1)));
+  write("again/b.plist", sampleLog(2));
+  EXPECT_EQ(run({at("again"), at("outbox"), "--json"}).out,
+            "{\n  \"format_version\": 1,\n  \"loaded\": 0,\n  \"known\": 4,\n  \"refused\": 0,\n"
+            "  \"others\": 2\n}\n");
+}
+
+TEST_F(LoadTest, TakesAServersUploads) {
+  const std::string name = "log-tallied-20261127T180218Z-5f0c9a1e.log";
+  write("srv/device-7/" + name + ".gz", gzipped(sampleLog(7)));
+  write("srv/device-8/" + name + ".gz", gzipped(sampleLog(8)));
+  write("srv/device-9/" + name + ".gz", gzipped(sampleLog(9)));
+  write("srv/device-9/report-20261127T180218Z-5f0c9a1e.log.gz", gzipped("of another kind"));
+  write("srv/.unfinished/0000000001", "half");
+  const auto line = [&](const char* device, const char* status, const char* os,
+                        const char* options) {
+    return format(
+        "{\"time\":\"t\",\"device\":\"%s\",\"log\":\"%s\",\"status\":%s,\"type\":\"193\","
+        "\"name\":\"log-tallied\",\"os_version\":\"%s\",\"filed\":\"\",\"options\":\"%s\"}\n",
+        device, name, status, os, options);
+  };
+  write("old.log.gz", gzipped(line("device-7", "201", "Pellio 4.1", "")));
+  write("lines.log",
+        line("device-7", "204", "Pell%C3%ADo 4.2", "previous_os_version=4.1%26%3D&ConfigNumber=C") +
+            line("device-8", "201", "Pellio 5", "previous_os_version=<unknown>") + "{\"half\":\n" +
+            line("device-9", "413", "Pellio 6", ""));
+  const Outcome outcome =
+      run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
+  EXPECT_EQ(outcome.error, "tavrel-fleet: lines.log: 2 lines tell of no log that has arrived\n");
+  EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind\n");
+  EXPECT_EQ(versions(),
+            (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||"}));
+}
+
+TEST_F(LoadTest, TakesArchives) {
+  write("in/d/a.log", sampleLog(1));
+  write("in/d/a.metadata.plist", kMetadata);
+  write("in/d/b.log.gz", gzipped(sampleLog(2)));
+  write("in/d/c.log", sampleLog(3).substr(0, 500));
+  std::filesystem::create_symlink("a.log", at("in/d/link.log"));
+  const std::string pack = format(
+      "cd %s && tar -cf all.tar -C in d && tar -czf all.tgz -C in d && "
+      "head -c 2000 all.tar > cut.tar",
+      at(""));
+  ASSERT_EQ(std::system(pack.c_str()), 0);
+  const Outcome outcome = run({at("all.tar")});
+  EXPECT_EQ(outcome.out, "2 loaded, 0 known, 1 refused\n");
+  EXPECT_EQ(outcome.status, 1);
+  EXPECT_NE(outcome.error.find("skipped: all.tar: d/link.log: is not a regular file\n"),
+            std::string::npos);
+  EXPECT_NE(outcome.error.find("refused: all.tar: d/c.log: is cut short: the property list does "
+                               "not end within its 500 bytes\n"),
+            std::string::npos);
+  EXPECT_EQ(versions(),
+            (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
+  EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 1 refused\n");
+  const Outcome cut = run({at("cut.tar")});
+  EXPECT_NE(cut.error.find("refused: cut.tar: cannot be read on: "), std::string::npos)
+      << cut.error;
+  EXPECT_EQ(cut.status, 1);
+}
+
+TEST_F(LoadTest, SetsAsideWhatItRefuses) {
+  write("in/good.log", sampleLog(1));
+  write("in/bad.log", "nonsense");
+  write("in/sub/empty.log", "");
+  std::filesystem::create_symlink("good.log", at("in/link.log"));
+  std::filesystem::create_directory_symlink(at("in"), at("in/sub/loop"));
+  ASSERT_EQ(mkfifo(at("in/pipe.log").c_str(), 0600), 0);
+  for (int time = 0; time < 2; ++time) {
+    const Outcome outcome = run({at("in"), at("none.log"), "--set-aside", at("aside/deep")});
+    EXPECT_EQ(outcome.error,
+              "tavrel-fleet: refused: in/bad.log: is not a property list\n"
+              "tavrel-fleet: skipped: in/link.log: is a symbolic link\n"
+              "tavrel-fleet: skipped: in/pipe.log: is not a regular file\n"
+              "tavrel-fleet: refused: in/sub/empty.log: is empty\n"
+              "tavrel-fleet: refused: none.log: cannot be found: No such file or directory\n");
+    EXPECT_EQ(outcome.status, 1);
+  }
+  std::map<std::string, std::string> kept;
+  for (const auto& file : std::filesystem::directory_iterator(at("aside/deep")))
+    kept[file.path().filename().string().substr(17)] = withoutFolder(contentOf(file.path()));
+  EXPECT_EQ(kept,
+            (std::map<std::string, std::string>{
+                {"bad.log", "nonsense"},
+                {"bad.log.reason", "in/bad.log: is not a property list\n"},
+                {"empty.log.reason", "in/sub/empty.log: is empty\n"},
+                {"none.log.reason", "none.log: cannot be found: No such file or directory\n"}}));
+  EXPECT_EQ(contentOf(at("in/bad.log")), "nonsense");
+}
+
+TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
+  const auto group = [](const char* scalars) {
+    return format(
+        "<plist version=\"1.0\"><dict><key>A</key><dict><key>ScalarKeys</key><dict>"
+        "<key>com.example.a&lt;b&amp;c</key><dict/></dict><key>ScalarKeyPrefixes</key>"
+        "<dict>%s</dict></dict><key>InternalTesting</key><dict><key>DistributionKeyPrefixes"
+        "</key><dict><key>com.example.</key><dict/></dict></dict></dict></plist>",
+        scalars);
+  };
+  const std::string wide = group("<key>com.example.st</key><dict/>");
+  const std::string narrow = group("<key>com.example.st</key><true/>");
+  const auto logOf = [](const std::string& whitelist, int starts) {
+    std::string digest;
+    appendHex(digest, LinuxDigest().md5(asBytes(whitelist)));
+    return changed(sampleLog(starts), "eb42570d2e2f7addc42403d203dafde4", digest);
+  };
+  write("wide.plist", wide);
+  write("narrow.plist", narrow);
+  write("in/1.log", logOf(wide, 1));
+  write("in/2.log", logOf(narrow, 2));
+  write("in/3.log", sampleLog(3));
+  const Outcome outcome =
+      run({at("in"), "--whitelist", at("wide.plist"), "--whitelist", at("narrow.plist")});
+  EXPECT_EQ(
+      outcome.error,
+      "tavrel-fleet: refused: in/2.log: BHScalars/com.example.starts: its whitelist does not "
+      "permit the key\n"
+      "tavrel-fleet: refused: in/3.log: its whitelist \"eb42570d2e2f7addc42403d203dafde4\" is "
+      "not among those given\n");
+  EXPECT_EQ(outcome.out, "1 loaded, 0 known, 2 refused\n");
+  EXPECT_EQ(run({at("in"), "--whitelist", at("none.plist")}).error,
+            "tavrel-fleet: whitelist none.plist: cannot be read: No such file or directory\n");
+}
+
+TEST_F(LoadTest, LosesNothingAndCountsNothingTwiceWhenKilled) {
+  constexpr int kLogs = 2'000;
+  writeMany(kLogs);
+  ASSERT_EQ(run({at("many")}).out, format("%d loaded, 0 known, 0 refused\n", kLogs));
+  const auto expected = everything();
+  std::filesystem::remove(at("fleet.db"));
+  std::size_t killed = 0;
+  for (int delay = 0; delay < 20; ++delay) {
+    const pid_t loader = startLoader(at("many"));
+    std::this_thread::sleep_for(std::chrono::milliseconds(10 * delay));
+    kill(loader, SIGKILL);
+    int status = 0;
+    ASSERT_EQ(waitpid(loader, &status, 0), loader);
+    if (WIFSIGNALED(status)) ++killed;
+  }
+  EXPECT_GT(killed, 0U);
+  EXPECT_EQ(run({at("many")}).status, 0);
+  EXPECT_TRUE(everything() == expected);
+}
+
+TEST_F(LoadTest, FilesOnceWhatTwoLoadersBring) {
+  constexpr int kLogs = 2'500;
+  writeMany(kLogs);
+  const pid_t loaders[] = {startLoader(at("many")), startLoader(at("many"))};
+  for (const pid_t loader : loaders) {
+    int status = 0;
+    ASSERT_EQ(waitpid(loader, &status, 0), loader);
+    EXPECT_EQ(status, 0);
+  }
+  EXPECT_EQ(rows("SELECT count(*), count(DISTINCT digest) FROM log"),
+            (std::multiset<std::string>{format("%d|%d", kLogs, kLogs)}));
+  EXPECT_EQ(rows("SELECT count(*) FROM scalar"),
+            (std::multiset<std::string>{std::to_string(2 * kLogs)}));
+}
+
+TEST_F(LoadTest, SaysHowItIsUsed) {
+  EXPECT_EQ(run({}).status, 2);
+  EXPECT_EQ(run({"x", "--nonsense"}).error,
+            "tavrel-fleet: The following argument was not expected: --nonsense: see 'tavrel-fleet "
+            "load --help'\n");
+}
+
+}  // namespace
+}  // namespace tavrel::fleet
