@@ -1,0 +1,52 @@
+// The histogram cells of many logs, coarsened until each counts values of enough devices.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <map>
+#include <utility>
+#include <vector>
+
+#include "fleet/questions/histogram.h"
+#include "fleet/questions/log_set.h"
+
+namespace tavrel::fleet {
+
+/// Collects the cells of one key in one set of logs.
+///
+/// Where whitelists drew the boundaries differently, cells overlap in part; they are then divided
+/// into classes of cells that do not. Within a class, neighbouring cells of too few devices are
+/// joined. Of classes that have too few devices altogether only the number of values is kept, as
+/// one cell over all numbers; when it has too few devices, too, the cell with the fewest values
+/// joins it. Each resulting cell is of enough devices, and so is whatever can be computed from
+/// them.
+class CellClasses {
+ public:
+  explicit CellClasses(const LogTable& table) : table_(table) {}
+
+  /// A cell whose ends are no interval, or that has no values, is left out.
+  void add(LogIndex log, const Cell& cell);
+
+  struct Coarsened {
+    std::vector<Cell> cells;  ///< none when all of them together are of too few devices
+    bool isJoined = false;    ///< whether some were joined
+  };
+  Coarsened coarsened(std::size_t devicesAtLeast) const;
+
+ private:
+  using Ends = std::pair<double, double>;
+  struct Counted {
+    std::uint64_t count = 0;
+    std::vector<LogIndex> logs;
+  };
+  using Class = std::map<Ends, const Counted*>;
+
+  std::vector<Class> classes(std::vector<const Counted*>& rest) const;
+  void joinSmall(const Class& all, std::size_t devicesAtLeast, DeviceCounter& counter,
+                 Coarsened& result) const;
+
+  const LogTable& table_;
+  std::map<Ends, Counted> cells_;
+};
+
+}  // namespace tavrel::fleet

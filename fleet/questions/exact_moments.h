@@ -1,0 +1,50 @@
+// The mean and the squared deviations of many values, or of many summaries of values, exactly.
+//
+// Sums are kept without an error and rounded once, when they are asked for: the results are the
+// doubles nearest to the true ones, whatever the order of the terms.
+#pragma once
+
+#include <cstdint>
+
+#include "fleet/questions/wide_sum.h"
+
+namespace tavrel::fleet {
+
+class ExactMoments {
+ public:
+  /// `count` values of this mean whose squared deviations from it add up to `squaredDeviations`.
+  void add(double mean, double squaredDeviations, std::uint64_t count);
+  void add(double value) { add(value, 0, 1); }
+  void add(std::int64_t value);
+  void add(const ExactMoments& other);
+
+  /// Stays at 2^64 - 1 when there are more.
+  std::uint64_t count() const { return count_; }
+
+  /// The mean of all values. Not-a-number without values, when a mean was not-a-number, when both
+  /// infinities are among them, and when the count does not fit; an infinity when one was.
+  double mean() const;
+
+  /// The sum of squared deviations from `mean()`, not divided by the count. Not-a-number when the
+  /// mean is no finite number or a sum of squared deviations was none.
+  double squaredDeviations() const;
+
+ private:
+  // The last bit of the sum weighs that of the smallest double; of the sum of squares, its square.
+  static constexpr int kLastBit = -1074;
+  static constexpr std::size_t kSumLimbs = 34;      // below 2^(1024 + 64) either way
+  static constexpr std::size_t kSquaresLimbs = 67;  // below 2^(2048 + 64)
+
+  bool grow(std::uint64_t count);
+  void addTerm(std::uint64_t mantissa, int exponent, bool isNegative, std::uint64_t count);
+
+  WideSum<kSumLimbs> sum_;
+  WideSum<kSquaresLimbs> squares_;  // also the squared deviations of summaries
+  std::uint64_t count_ = 0;
+  bool overflowed_ = false;
+  bool hasInfinity_[2] = {false, false};  // positive, negative
+  bool hasNan_ = false;
+  bool hasStrangeDeviations_ = false;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,24 @@
+// Divides logs by an attribute.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "fleet/questions/ledger.h"
+#include "fleet/questions/show.h"
+
+namespace tavrel::fleet {
+
+/// Orders texts as people number versions: "4.9" before "4.10".
+bool versionLess(std::string_view a, std::string_view b);
+
+/// One group for each value of the attribute that occurs among `logs`, in their order (versions as
+/// numbered, days as they passed); `kNone` has one group. Values with fewer than `logsAtLeast`
+/// logs, and those after the thousand most frequent ones, come as one small group.
+std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
+                            std::size_t logsAtLeast);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,78 @@
+#include "fleet/questions/ledger.h"
+
+#include <algorithm>
+#include <utility>
+
+namespace tavrel::fleet {
+
+bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
+  if (!hasEnough(logs)) return false;
+  const auto found = shown_.find(subject);
+  if (found == shown_.end()) return true;
+  return std::all_of(found->second.begin(), found->second.end(), [&](const auto& other) {
+    return logs == *other || hasEnough(logs.differenceWith(*other));
+  });
+}
+
+void Ledger::noteShown(const std::string& subject, const LogSet& logs) {
+  std::shared_ptr<const LogSet> kept;
+  const std::size_t hash = logs.hash();
+  const auto [first, last] = known_.equal_range(hash);
+  for (auto known = first; known != last && !kept; ++known) {
+    if (*known->second == logs) kept = known->second;
+  }
+  if (!kept) {
+    kept = std::make_shared<const LogSet>(logs);
+    known_.emplace(hash, kept);
+  }
+  auto& sets = shown_[subject];
+  if (std::find(sets.begin(), sets.end(), kept) == sets.end()) sets.push_back(std::move(kept));
+}
+
+Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups) {
+  const LogTable& table = ledger.table();
+  Division division{LogSet(table), false, {}, 0};
+  std::erase_if(groups, [](const Group& group) { return group.logs.empty(); });
+  for (const Group& group : groups)
+    division.whole.add(group.logs);
+  if (!ledger.allows(subject, division.whole)) return division;
+  division.isShown = true;
+  ledger.noteShown(subject, division.whole);
+
+  struct Part {
+    std::size_t devices;
+    std::size_t position;  // among the groups
+    bool isAllowed;
+  };
+  std::vector<Part> parts;
+  for (std::size_t i = 0; i < groups.size(); ++i) {
+    const LogSet& logs = groups[i].logs;
+    parts.push_back({logs.devices(table), i, !groups[i].isSmall && ledger.allows(subject, logs)});
+  }
+  std::stable_sort(parts.begin(), parts.end(), [](const Part& a, const Part& b) {
+    return a.isAllowed != b.isAllowed ? b.isAllowed : a.devices < b.devices;
+  });
+
+  LogSet other(table);
+  std::size_t joined = 0;
+  while (joined < parts.size() &&
+         (!parts[joined].isAllowed || (joined != 0 && !ledger.allows(subject, other)))) {
+    const Group& group = groups[parts[joined++].position];
+    other.add(group.logs);
+    division.joined += group.values;
+  }
+  if (joined == parts.size()) return division;
+
+  std::vector<bool> isJoined(groups.size());
+  for (std::size_t i = 0; i < joined; ++i)
+    isJoined[parts[i].position] = true;
+  for (std::size_t i = 0; i < groups.size(); ++i) {
+    if (!isJoined[i]) division.groups.push_back(std::move(groups[i]));
+  }
+  if (joined != 0) division.groups.push_back({kOtherTitle, std::move(other)});
+  for (const Group& group : division.groups)
+    ledger.noteShown(subject, group.logs);
+  return division;
+}
+
+}  // namespace tavrel::fleet

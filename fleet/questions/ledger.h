@@ -1,0 +1,71 @@
+// What one run has shown, and what it therefore must not show.
+//
+// A set of logs of fewer than K devices is never shown. Nor is one from which, together with what
+// was shown before of the same subject, somebody could tell such a set by a subtraction.
+#pragma once
+
+#include <cstddef>
+#include <map>
+#include <memory>
+#include <string>
+#include <vector>
+
+#include "fleet/questions/log_set.h"
+
+namespace tavrel::fleet {
+
+inline constexpr std::size_t kDefaultDevicesAtLeast = 10;
+/// Of two devices, the owner of one could tell the figures of the other.
+inline constexpr std::size_t kFewestDevicesAtLeast = 3;
+
+class Ledger {
+ public:
+  Ledger(const LogTable& table, std::size_t devicesAtLeast)
+      : table_(table), devicesAtLeast_(devicesAtLeast) {}
+
+  const LogTable& table() const { return table_; }
+  std::size_t devicesAtLeast() const { return devicesAtLeast_; }
+  bool hasEnough(const LogSet& logs) const { return logs.devices(table_) >= devicesAtLeast_; }
+
+  /// Whether the set has enough devices and equals each shown set of the subject, or differs from
+  /// it by enough devices.
+  bool allows(const std::string& subject, const LogSet& logs) const;
+  void noteShown(const std::string& subject, const LogSet& logs);
+
+  using Shown = std::map<std::string, std::vector<std::shared_ptr<const LogSet>>>;
+  const Shown& shown() const { return shown_; }
+
+ private:
+  const LogTable& table_;
+  const std::size_t devicesAtLeast_;
+  Shown shown_;
+  // Many subjects have the same sets.
+  std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;
+};
+
+struct Group {
+  std::string title;
+  LogSet logs;
+  std::size_t values = 1;  ///< how many values of the attribute it stands for
+  bool isSmall = false;    ///< whether it must not be shown by itself
+};
+
+/// A set of logs and its parts.
+struct Division {
+  LogSet whole;
+  bool isShown = false;  ///< when not, nothing of it may be shown
+  std::vector<Group> groups;
+  /// How many values were joined as the last group, `kOtherTitle`.
+  std::size_t joined = 0;
+};
+
+/// The title of the group of joined ones; no group of one value is called so.
+inline constexpr const char* kOtherTitle = "(other)";
+
+/// Divides the union of the groups, which have no log in common, into parts that may be shown, and
+/// notes these and the whole as shown. Groups of too few devices are joined, and with them as many
+/// of the smallest others as it takes: what remains of the whole without the shown groups must have
+/// enough devices, too. Empty groups are dropped; a whole that cannot be divided has no groups.
+Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups);
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,90 @@
+#include "fleet/questions/log_set.h"
+
+#include <algorithm>
+
+namespace tavrel::fleet {
+
+namespace {
+
+std::size_t ones(std::uint64_t word) {
+  return static_cast<std::size_t>(std::popcount(word));
+}
+
+/// The bits of [begin, end) that are set.
+std::size_t onesBetween(const std::vector<std::uint64_t>& words, LogIndex begin, LogIndex end) {
+  std::size_t count = 0;
+  for (std::size_t word = begin / 64; word * 64 < end; ++word) {
+    std::uint64_t bits = words[word];
+    if (word == begin / 64) bits &= ~std::uint64_t{0} << begin % 64;
+    if (end - word * 64 < 64) bits &= (std::uint64_t{1} << (end - word * 64)) - 1;
+    count += ones(bits);
+  }
+  return count;
+}
+
+}  // namespace
+
+bool LogSet::empty() const {
+  return std::all_of(words_.begin(), words_.end(), [](std::uint64_t word) { return word == 0; });
+}
+
+void LogSet::add(const LogSet& other) {
+  for (std::size_t i = 0; i < words_.size(); ++i)
+    words_[i] |= other.words_[i];
+}
+
+std::size_t LogSet::logs() const {
+  std::size_t count = 0;
+  for (const std::uint64_t word : words_)
+    count += ones(word);
+  return count;
+}
+
+std::size_t LogSet::devices(const LogTable& table) const {
+  std::size_t most = 0;
+  for (const LogTable::Day& day : table.days()) {
+    most = std::max(most, onesBetween(words_, day.begin, day.end));
+  }
+  return most;
+}
+
+std::vector<std::size_t> LogSet::logsByDay(const LogTable& table) const {
+  std::vector<std::size_t> counts;
+  counts.reserve(table.days().size());
+  for (const LogTable::Day& day : table.days()) {
+    counts.push_back(onesBetween(words_, day.begin, day.end));
+  }
+  return counts;
+}
+
+LogSet LogSet::differenceWith(const LogSet& other) const {
+  LogSet result = *this;
+  for (std::size_t i = 0; i < words_.size(); ++i)
+    result.words_[i] ^= other.words_[i];
+  return result;
+}
+
+std::size_t LogSet::hash() const {
+  std::uint64_t result = 0;
+  for (const std::uint64_t word : words_)
+    result = (std::rotl(result, 5) ^ word) * 0x9e3779b97f4a7c15U;
+  return static_cast<std::size_t>(result);
+}
+
+void DeviceCounter::insert(LogIndex log) {
+  if (seen_[log]) return;
+  seen_[log] = true;
+  logs_.push_back(log);
+  devices_ = std::max<std::size_t>(devices_, ++ofDay_[table_.dayIndex(log)]);
+}
+
+void DeviceCounter::clear() {
+  for (const LogIndex log : logs_) {
+    seen_[log] = false;
+    ofDay_[table_.dayIndex(log)] = 0;
+  }
+  logs_.clear();
+  devices_ = 0;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,70 @@
+// Sets of logs of one LogTable, and how many devices they are of.
+//
+// A log is one day of one device and does not say which, so nobody can count devices. But on one
+// day each has one log: a set is of at least as many devices as it has logs of any one day.
+#pragma once
+
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <vector>
+
+#include "fleet/questions/log_table.h"
+
+namespace tavrel::fleet {
+
+class LogSet {
+ public:
+  /// An empty set.
+  explicit LogSet(const LogTable& table) : words_((table.size() + 63) / 64) {}
+
+  void insert(LogIndex log) { words_[log / 64] |= std::uint64_t{1} << log % 64; }
+  bool contains(LogIndex log) const { return (words_[log / 64] >> log % 64 & 1) != 0; }
+  template <class Use>
+  void forEach(const Use& use) const {
+    for (std::size_t i = 0; i < words_.size(); ++i) {
+      for (std::uint64_t word = words_[i]; word != 0; word &= word - 1) {
+        use(static_cast<LogIndex>(i * 64 + static_cast<std::size_t>(std::countr_zero(word))));
+      }
+    }
+  }
+  bool empty() const;
+  void add(const LogSet& other);
+
+  bool operator==(const LogSet&) const = default;
+
+  std::size_t logs() const;
+  /// The largest number of logs of one day.
+  std::size_t devices(const LogTable& table) const;
+  /// The number of logs of each day of the table.
+  std::vector<std::size_t> logsByDay(const LogTable& table) const;
+
+  /// What is in one of the two sets but not in both.
+  LogSet differenceWith(const LogSet& other) const;
+  std::size_t hash() const;
+
+ private:
+  std::vector<std::uint64_t> words_;
+};
+
+/// Counts the devices of a set that grows log by log.
+class DeviceCounter {
+ public:
+  explicit DeviceCounter(const LogTable& table)
+      : table_(table), seen_(table.size()), ofDay_(table.days().size()) {}
+
+  /// A log that is there already changes nothing.
+  void insert(LogIndex log);
+  std::size_t devices() const { return devices_; }
+  /// Begins an empty set; takes the time of the logs in the old one.
+  void clear();
+
+ private:
+  const LogTable& table_;
+  std::vector<bool> seen_;
+  std::vector<std::uint32_t> ofDay_;
+  std::vector<LogIndex> logs_;
+  std::size_t devices_ = 0;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,49 @@
+#include "fleet/questions/scalar_histogram.h"
+
+#include <algorithm>
+#include <cmath>
+#include <limits>
+
+namespace tavrel::fleet {
+
+std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
+  constexpr double kBuckets = 10;
+  constexpr double kBeyond = 3;  // buckets on each side
+  const auto at = [&](unsigned percent) {
+    return static_cast<double>(
+        ascending[static_cast<std::size_t>(nearestRank(ascending.size(), percent)) - 1]);
+  };
+  const double low = at(5);
+  const double high = at(95);
+
+  double step = 1;
+  const double wanted = (high - low) / kBuckets;
+  for (double power = 1; step < wanted; power *= 10) {
+    for (const double factor : {1.0, 2.0, 5.0, 10.0}) {
+      step = factor * power;
+      if (step >= wanted) break;
+    }
+  }
+  std::vector<double> boundaries;
+  // No bucket lies wholly beyond all values.
+  const auto smallest = static_cast<double>(ascending.front());
+  const auto largest = static_cast<double>(ascending.back());
+  const double first = std::max(std::floor(low / step) - kBeyond, std::floor(smallest / step));
+  const double last = std::min(std::ceil(high / step) + kBeyond, std::ceil(largest / step));
+  for (double i = first; i <= last; i += 1) {
+    // Beyond 2^53 neighbouring multiples can be one number.
+    if (boundaries.empty() || boundaries.back() < i * step) boundaries.push_back(i * step);
+    if (i + 1 == i) break;
+  }
+  return boundaries;
+}
+
+Cell bucketOf(std::span<const double> boundaries, std::int64_t value) {
+  constexpr double kInfinity = std::numeric_limits<double>::infinity();
+  const auto upper =
+      std::lower_bound(boundaries.begin(), boundaries.end(), static_cast<double>(value));
+  return {upper == boundaries.begin() ? -kInfinity : *(upper - 1),
+          upper == boundaries.end() ? kInfinity : *upper, 1};
+}
+
+}  // namespace tavrel::fleet

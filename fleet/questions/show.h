@@ -1,0 +1,78 @@
+// The question about one statistic: how it is distributed over the devices, or what all its values
+// give together; whole, divided by an attribute of the logs, and beside other days or versions.
+#pragma once
+
+#include <array>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "fleet/engine/engine.h"
+#include "fleet/questions/histogram.h"
+#include "fleet/questions/ledger.h"
+#include "fleet/questions/log_table.h"
+
+namespace tavrel::fleet {
+
+enum class GroupBy : std::uint8_t { kNone, kOs, kRegion, kDay, kDigest };
+
+inline constexpr std::array<unsigned, 5> kPercents = {5, 25, 50, 75, 95};
+
+struct ShowRequest {
+  std::string key;
+  KeyKind kind = KeyKind::kScalar;  ///< a distribution brings its histogram along
+  GroupBy by = GroupBy::kNone;
+  DayRange days{};
+  /// At most one: other days, which must not overlap the first, or a version. With a version, the
+  /// first side is the logs of all other ones.
+  std::optional<DayRange> againstDays{};
+  std::optional<std::string> againstVersion{};
+};
+
+/// Of a scalar: the values of the logs, one a day and device.
+struct ScalarSpread {
+  std::int64_t minimum = 0;
+  std::int64_t maximum = 0;
+  double mean = 0;               ///< the double nearest to the exact mean
+  double squaredDeviations = 0;  ///< from the exact mean, rounded once
+  std::array<std::int64_t, kPercents.size()> percentiles{};  ///< by the nearest rank
+};
+
+struct HistogramAnswer {
+  std::uint64_t values = 0;
+  std::vector<Piece> pieces;  ///< empty when there is none to show
+  bool isJoined = false;      ///< whether buckets were joined, because they had too few devices
+  /// Of a distribution: where the percentiles lie.
+  std::vector<Interval> percentiles;
+};
+
+/// What is told of one set of logs.
+struct ShownSet {
+  std::string title;
+  std::size_t logs = 0;
+  std::size_t devices = 0;  ///< the largest number of its logs on one day
+  std::optional<ScalarSpread> scalar;
+  std::optional<FiveNumbers> merged;
+  HistogramAnswer histogram;
+};
+
+struct ShowSide {
+  std::string title;
+  bool isShown = false;  ///< when not, it has too few devices, and the rest is empty
+  ShownSet whole;
+  std::vector<ShownSet> groups;
+  std::size_t joined = 0;  ///< groups that are shown as one
+};
+
+struct ShowAnswer {
+  ShowRequest request;
+  std::size_t devicesAtLeast = 0;
+  std::vector<ShowSide> sides;  ///< one, or two with `against`
+};
+
+/// Throws EngineError. The days of `request` overlap none of `againstDays`.
+ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request);
+
+}  // namespace tavrel::fleet

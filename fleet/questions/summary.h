@@ -1,0 +1,43 @@
+// What the fleet consists of.
+#pragma once
+
+#include <cstddef>
+#include <cstdint>
+#include <string>
+#include <vector>
+
+#include "fleet/engine/engine.h"
+#include "fleet/questions/ledger.h"
+#include "fleet/questions/show.h"
+
+namespace tavrel::fleet {
+
+struct CountedGroup {
+  std::string title;
+  std::size_t logs = 0;
+  std::size_t devices = 0;  ///< the largest number of its logs on one day
+  std::int32_t firstDay = 0;
+  std::int32_t lastDay = 0;
+};
+
+struct SummaryPart {
+  GroupBy by = GroupBy::kNone;
+  std::vector<CountedGroup> groups;  ///< empty when the logs cannot be divided by this
+  std::size_t joined = 0;            ///< groups that are shown as one
+};
+
+struct SummaryAnswer {
+  std::size_t devicesAtLeast = 0;
+  DayRange days;         ///< those asked for
+  bool isShown = false;  ///< when not, there are too few devices, and the rest is empty
+  CountedGroup whole;
+  std::vector<SummaryPart> parts;  ///< by version, region, whitelist and day
+  std::size_t scalarKeys = 0;
+  std::size_t distributionKeys = 0;
+  std::size_t histogramKeys = 0;
+};
+
+/// Throws EngineError.
+SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days);
+
+}  // namespace tavrel::fleet

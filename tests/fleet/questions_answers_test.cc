@@ -1,0 +1,240 @@
+// Questions put to whole fleets: what is told, and what must not be.
+#include <cmath>
+#include <gmock/gmock.h>
+#include <map>
+#include <random>
+
+#include "fleet/questions/compare.h"
+#include "fleet/questions/show.h"
+#include "fleet/questions/summary.h"
+#include "tests/fleet/questions_fleet.h"
+
+namespace tavrel::fleet {
+namespace {
+
+using testing::ElementsAre;
+
+constexpr double kInfinity = std::numeric_limits<double>::infinity();
+
+std::vector<std::string> titles(const auto& groups) {
+  std::vector<std::string> result;
+  for (const auto& group : groups)
+    result.push_back(group.title + " " + std::to_string(group.devices) + "/" +
+                     std::to_string(group.logs));
+  return result;
+}
+
+TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
+  TestFleet fleet;
+  for (int device = 0; device < 40; ++device) {
+    const char* region = device < 20 ? "DE" : device < 35 ? "AT" : device < 38 ? "CH" : "LI";
+    for (const int day : {1, 2}) {
+      LogRecord& record = fleet.add(day, "OS 4.10", region);
+      record.scalars = {{"s", device}};
+    }
+  }
+  fleet.add(3, "OS 4.9");
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 5);
+  const ShowRequest request{.key = "s", .by = GroupBy::kRegion};
+  const ShowAnswer answer = show(fleet.engine(), ledger, request);
+  ASSERT_EQ(answer.sides.size(), 1u);
+  const ShowSide& side = answer.sides[0];
+  EXPECT_THAT(titles(side.groups), ElementsAre("AT 15/30", "DE 20/40", "(other) 5/10"));
+  EXPECT_EQ(side.joined, 2u);
+  EXPECT_EQ(side.whole.logs, 80u);
+  EXPECT_EQ(side.whole.scalar->mean, 19.5);
+  EXPECT_EQ(side.whole.scalar->squaredDeviations, 2 * 40 * (1600 - 1) / 12.0);
+  EXPECT_THAT(side.whole.scalar->percentiles, ElementsAre(1, 9, 19, 29, 37));
+  // Of 20 there is one device, in a bucket by itself.
+  EXPECT_EQ(side.groups[0].histogram.pieces.front(), (Piece{15, 25, 12, 12}));
+  EXPECT_EQ(side.whole.histogram.values, 80u);
+
+  Ledger strict(table, 21);
+  EXPECT_TRUE(show(fleet.engine(), strict, request).sides[0].groups.empty());
+  Ledger stricter(table, 41);
+  EXPECT_FALSE(show(fleet.engine(), stricter, request).sides[0].isShown);
+  Ledger again(table, 5);
+  const ShowAnswer beside =
+      show(fleet.engine(), again, {.key = "s", .days = {1, 1}, .againstDays = DayRange{2, 3}});
+  EXPECT_EQ(beside.sides[1].whole.logs, 40u);
+  EXPECT_EQ(summarise(fleet.engine(), again, {}).parts[0].groups.size(), 0u);  // 4.9 has one device
+}
+
+TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
+  TestFleet fleet;
+  for (int device = 0; device < 20; ++device) {
+    LogRecord& record = fleet.add(1, "OS 1");
+    record.distributions = {{"d", {0, 30, static_cast<double>(device), 1, 4}}};
+    record.cells = {{"d", -kInfinity, 10, "(-inf, 10]", device < 2 ? 2u : 3u}};
+    if (device < 2) record.cells.push_back({"d", 20, kInfinity, "(20, inf)", 1});
+    record.cells.push_back({"d", 10, 20, "(10, 20]", 1});
+  }
+  for (int device = 0; device < 3; ++device) {  // a whitelist of few devices, and one without
+    LogRecord& record = fleet.add(1, "OS 1");
+    record.distributions = {{"d", {1, 31, 10, 0, 2}}};
+    if (device > 0) record.cells = {{"d", 5, 15, "(5, 15]", 2}};
+  }
+  fleet.add(1, "OS 1").distributions = {{"d", {}}};
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 5);
+  const ShowAnswer answer =
+      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
+  const ShownSet& whole = answer.sides[0].whole;
+  EXPECT_EQ(whole.devices, 23u);
+  EXPECT_EQ(whole.merged->count, 86u);
+  EXPECT_EQ(whole.merged->maximum, 31);
+  EXPECT_EQ(whole.merged->mean, (4 * 190 + 60) / 86.0);
+  // The two devices above 20 are joined with their neighbours. The 6 values of the last three
+  // devices may lie anywhere, with those of the smallest bucket.
+  EXPECT_THAT(whole.histogram.pieces,
+              ElementsAre(Piece{-kInfinity, 10, 58, 86}, Piece{10, kInfinity, 0, 28}));
+  EXPECT_EQ(whole.histogram.values, 86u);
+  EXPECT_THAT(
+      whole.histogram.percentiles,
+      ElementsAre(Interval{-kInfinity, 10}, Interval{-kInfinity, 10}, Interval{-kInfinity, 10},
+                  Interval{-kInfinity, kInfinity}, Interval{-kInfinity, kInfinity}));
+}
+
+/// Whether all that can be computed from the shown sets is of enough devices: the logs that the
+/// same sets contain, for each choice of sets, are no devices or enough.
+void expectNothingSmallFollows(const Ledger& ledger) {
+  const LogTable& table = ledger.table();
+  for (const auto& [subject, sets] : ledger.shown()) {
+    for (const auto& a : sets) {
+      EXPECT_GE(a->devices(table), ledger.devicesAtLeast());
+      for (const auto& b : sets) {
+        const std::size_t devices = a->differenceWith(*b).devices(table);
+        EXPECT_TRUE(devices == 0 || devices >= ledger.devicesAtLeast()) << subject << devices;
+      }
+    }
+    if (subject == "logs") continue;  // of several groupings
+    std::map<std::vector<bool>, LogSet> cells;
+    for (LogIndex log = 0; log < table.size(); ++log) {
+      std::vector<bool> in;
+      for (const auto& set : sets)
+        in.push_back(set->contains(log));
+      cells.try_emplace(in, table).first->second.insert(log);
+    }
+    cells.erase(std::vector<bool>(sets.size()));
+    for (const auto& [in, logs] : cells)
+      EXPECT_TRUE(ledger.hasEnough(logs)) << subject;
+  }
+}
+
+TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
+  std::minstd_rand random(3);
+  std::size_t shown = 0;
+  for (int turn = 0; turn < 60; ++turn) {
+    TestFleet fleet;
+    const auto devices = static_cast<int>(5 + random() % 60);
+    const auto regions = 1 + random() % 8;
+    for (int device = 0; device < devices; ++device) {
+      const std::string region = "R" + std::to_string(random() % regions * (random() % regions));
+      for (std::int32_t day = 0; day < 6; ++day) {
+        if (random() % 4 == 0) continue;
+        LogRecord& record =
+            fleet.add(day, random() % 6 < static_cast<unsigned long>(day) ? "2" : "1", region);
+        if (random() % 5 != 0) record.scalars = {{"s", static_cast<std::int64_t>(random() % 50)}};
+      }
+    }
+    const LogTable table(fleet.engine());
+    Ledger ledger(table, 3 + random() % 8);
+    summarise(fleet.engine(), ledger, {});
+    const auto by = static_cast<GroupBy>(random() % 5);
+    ShowRequest request{.key = "s", .by = by};
+    if (random() % 2 == 0) {
+      request.days = {0, 2};
+      request.againstDays = DayRange{3, 5};
+    } else if (random() % 2 == 0) {
+      request.againstVersion = "2";
+    }
+    const ShowAnswer answer = show(fleet.engine(), ledger, request);
+    for (const ShowSide& side : answer.sides) {
+      shown += side.groups.size();
+      std::uint64_t values = 0;
+      for (const ShownSet& set : side.groups) {
+        values += set.logs;
+        EXPECT_GE(set.devices, ledger.devicesAtLeast());
+        EXPECT_EQ(set.histogram.values, set.logs);
+        for (const Piece& piece : set.histogram.pieces)
+          EXPECT_TRUE(piece.least == 0 || piece.least >= ledger.devicesAtLeast());
+      }
+      EXPECT_TRUE(side.groups.empty() || values == side.whole.logs);
+    }
+    expectNothingSmallFollows(ledger);
+    compare(fleet.engine(), ledger, {"1", "2", {}});
+    for (const auto& [subject, sets] : ledger.shown())
+      for (const auto& a : sets)
+        for (const auto& b : sets)
+          EXPECT_TRUE(a == b || ledger.hasEnough(a->differenceWith(*b))) << subject;
+  }
+  EXPECT_GT(shown, 100u);
+}
+
+TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
+  TestFleet fleet;
+  std::mt19937 random(4);
+  std::normal_distribution<double> noise(100, 10);
+  std::vector<std::string> names;
+  for (int key = 0; key < 40; ++key)
+    names.push_back("key" + std::to_string(key));
+  for (int device = 0; device < 200; ++device) {
+    const bool isNew = device % 2 == 0;
+    for (std::int32_t day = 0; day < 3; ++day) {
+      LogRecord& record = fleet.add(day, isNew ? "2" : "1");
+      for (const std::string& name : names)
+        record.scalars.push_back(
+            {name, std::lround(noise(random)) + (isNew && name == "key7" ? 9 : 0)});
+      record.scalars.push_back({"constant", isNew ? 2 : 1});
+      record.scalars.push_back({"same", 5});
+      record.scalars.push_back({isNew ? "new" : "old", 1});
+      record.distributions = {{"key8", {0, 1, noise(random) - (isNew ? 20 : 0), 5, 9}},
+                              {"odd", {0, 0, std::nan(""), 0, 1}}};
+      if (device < 10) record.scalars.push_back({"rare", 1});
+    }
+  }
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 10);
+  EXPECT_EQ(newestVersions(ledger, {})->second, "2");
+  const CompareAnswer answer = compare(fleet.engine(), ledger, {"1", "2", {}});
+  std::vector<std::string> found;
+  for (const Comparison& one : answer.comparisons)
+    if (one.isReal()) found.push_back(one.key.name);
+  EXPECT_THAT(found, ElementsAre("constant", "key8", "key7"));
+  EXPECT_EQ(answer.comparisons.size(), 43u);
+  EXPECT_EQ(answer.missing, 2u);
+  EXPECT_EQ(answer.tooFew, 1u);
+  EXPECT_EQ(answer.unfit, 1u);
+  const Comparison& slower = answer.comparisons[2];
+  EXPECT_NEAR(slower.difference, 9, 2);
+  EXPECT_NEAR(*slower.effect, 0.9, 0.2);
+  // 100 devices a side on each of three days count as 100 values: 1.97 × √(2 × 10² / 100).
+  EXPECT_NEAR(slower.margin, 2.79, 0.15);
+  EXPECT_EQ(answer.comparisons[0].effect, std::nullopt);
+  EXPECT_EQ(answer.comparisons.back().effect, 0);
+}
+
+// Devices that report often and are each like themselves: as values by themselves, their logs would
+// show differences that are none.
+TEST(CompareTest, TakesNoDayOfADeviceForAnotherDevice) {
+  std::mt19937 random(5);
+  std::normal_distribution<double> noise(0, 1000);
+  int wrong = 0;
+  for (int turn = 0; turn < 20; ++turn) {
+    TestFleet fleet;
+    for (int device = 0; device < 24; ++device) {
+      const std::int64_t value = std::lround(noise(random));
+      for (std::int32_t day = device % 5; day < 20; ++day)
+        fleet.add(day, device < 12 ? "1" : "2").scalars = {{"s", value}};
+    }
+    const LogTable table(fleet.engine());
+    Ledger ledger(table, 10);
+    const auto answer = compare(fleet.engine(), ledger, {"1", "2", {}});
+    wrong += answer.comparisons.at(0).isReal() ? 1 : 0;
+  }
+  EXPECT_LE(wrong, 3);
+}
+
+}  // namespace
+}  // namespace tavrel::fleet
