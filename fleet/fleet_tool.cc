@@ -4,14 +4,19 @@
 #include <exception>
 
 #include "base/version.h"
+#include "fleet/commands/compare_command.h"
 #include "fleet/commands/load_command.h"
+#include "fleet/commands/page_command.h"
+#include "fleet/commands/show_command.h"
+#include "fleet/commands/summary_command.h"
 #include "tools/shared/command_line.h"
 
 namespace tavrel::fleet {
 namespace {
 
 // In the order of the help.
-constexpr void (*kSubcommands[])(Command top, FleetContext& context) = {addLoadCommand};
+constexpr void (*kSubcommands[])(Command top, FleetContext& context) = {
+    addLoadCommand, addSummaryCommand, addShowCommand, addCompareCommand, addPageCommand};
 
 void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) {
   app.fallthrough();

@@ -7,13 +7,12 @@
 
 #include "base/format.h"
 #include "platform/linux/files/file_system.h"
-#include "platform/linux/linux_platform.h"
 
 namespace tavrel {
 
-Status writeOutput(ToolContext& context, const std::string& file, std::string_view bytes) {
+Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes) {
   if (file == "-") {
-    context.out() << bytes;
+    output.out() << bytes;
     return Done{};
   }
   // Replacing a device or a pipe by a file is never intended.
@@ -28,7 +27,7 @@ Status writeOutput(ToolContext& context, const std::string& file, std::string_vi
     const char* const reason = std::strerror(errno);
     return Error{format("cannot write %s: %s: %s", file, folder, reason)};
   }
-  return context.linuxPlatform().fileSystem().replace(path.string(), asBytes(bytes), 0644);
+  return FileSystem().replace(path.string(), asBytes(bytes), 0644);
 }
 
 }  // namespace tavrel

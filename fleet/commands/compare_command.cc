@@ -1,0 +1,185 @@
+#include "fleet/commands/compare_command.h"
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "catalogue/catalogue.h"
+#include "fleet/commands/csv_writer.h"
+#include "fleet/commands/question.h"
+#include "fleet/questions/compare.h"
+#include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
+
+namespace tavrel::fleet {
+namespace {
+
+struct CompareOptions : QuestionOptions {
+  std::string before;
+  std::string after;
+  bool all = false;
+};
+
+std::string percentOf(std::optional<double> share) {
+  if (!share || !std::isfinite(*share)) return "";
+  return (*share > 0 ? "+" : "") + shortNumber(std::round(*share * 1000) / 10) + " %";
+}
+
+std::string signedText(double value) {
+  return (value > 0 ? "+" : "") + shortNumber(value);
+}
+
+/// Probabilities are shown to two digits.
+std::string probabilityText(double value) {
+  if (value < 1e-300) return "0";
+  const double digits = std::pow(10, 1 - std::floor(std::log10(value)));
+  return shortNumber(std::round(value * digits) / digits);
+}
+
+const char* kindName(const Comparison& one) {
+  return one.key.kind == KeyKind::kScalar ? "scalar" : "distribution";
+}
+
+std::string unitOf(const std::string& key) {
+  const catalogue::Entry* entry = catalogue::findStatistic(key);
+  return entry != nullptr ? std::string(entry->unit) : "";
+}
+
+std::string leftOutText(const CompareAnswer& answer) {
+  std::string text;
+  const auto add = [&](std::size_t count, const std::string& why) {
+    if (count != 0) text += "  " + counted(count, "statistic") + " " + why + "\n";
+  };
+  add(answer.missing, "not in both versions");
+  add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
+                         " devices, or close to a set that was shown");
+  add(answer.unfit, "with values that are no finite numbers");
+  return text.empty() ? text : "Left out:\n" + text;
+}
+
+void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
+  std::size_t changed = 0;
+  using Align = Table::Align;
+  Table table({{"KEY"},
+               {"BEFORE", Align::Right},
+               {"AFTER", Align::Right},
+               {"CHANGE", Align::Right},
+               {"RELATIVE", Align::Right},
+               {"95 % INTERVAL"},
+               {"UNIT"},
+               {"EFFECT", Align::Right},
+               {"CHANCE", Align::Right}});
+  for (const Comparison& one : answer.comparisons) {
+    if (one.isReal()) ++changed;
+    if (!one.isReal() && !all) continue;
+    table.add(
+        {{one.key.name, one.isReal() ? Emphasis::Strong : Emphasis::None},
+         shortNumber(one.before.mean),
+         shortNumber(one.after.mean),
+         signedText(one.difference),
+         percentOf(one.relative),
+         signedText(one.difference - one.margin) + " to " + signedText(one.difference + one.margin),
+         unitOf(one.key.name),
+         one.effect ? signedText(std::round(*one.effect * 100) / 100) : "constant",
+         probabilityText(one.corrected)});
+  }
+  std::ostream& out = context.out();
+  out << printable(answer.request.oldVersion) << " -> " << printable(answer.request.newVersion)
+      << ", " << textOf(answer.request.days) << ": " << changed << " of "
+      << counted(answer.comparisons.size(), "statistic") << " changed\n";
+  if (!table.empty()) {
+    out << "\n";
+    table.print(context.page());
+  }
+  const std::string leftOut = leftOutText(answer);
+  if (!leftOut.empty()) out << "\n" << leftOut;
+}
+
+Json sideJson(const ComparedSide& side) {
+  return {{"devices", side.devices},
+          {"logs", side.logs},
+          {"mean", realJson(side.mean)},
+          {"standard_deviation", side.deviation ? realJson(*side.deviation) : Json(nullptr)}};
+}
+
+Json compareJson(const CompareAnswer& answer) {
+  Json list = Json::array();
+  for (const Comparison& one : answer.comparisons) {
+    list.push_back({{"key", one.key.name},
+                    {"kind", kindName(one)},
+                    {"unit", unitOf(one.key.name)},
+                    {"changed", one.isReal()},
+                    {"before", sideJson(one.before)},
+                    {"after", sideJson(one.after)},
+                    {"difference", realJson(one.difference)},
+                    {"lower", realJson(one.difference - one.margin)},
+                    {"upper", realJson(one.difference + one.margin)},
+                    {"relative", one.relative ? realJson(*one.relative) : Json(nullptr)},
+                    {"effect", one.effect ? realJson(*one.effect) : Json(nullptr)},
+                    {"probability", one.probability},
+                    {"corrected_probability", one.corrected}});
+  }
+  return {{"old_version", answer.request.oldVersion},
+          {"new_version", answer.request.newVersion},
+          {"days", daysJson(answer.request.days)},
+          {"devices_at_least", answer.devicesAtLeast},
+          {"confidence", kConfidence},
+          {"comparisons", std::move(list)},
+          {"left_out",
+           {{"not_in_both", answer.missing},
+            {"too_few_devices", answer.tooFew},
+            {"not_finite", answer.unfit}}}};
+}
+
+void printCsv(std::ostream& out, const CompareAnswer& answer) {
+  CsvWriter csv(out);
+  for (const char* title : {"key", "kind", "unit", "changed", "devices_before", "devices_after",
+                            "mean_before", "mean_after", "difference", "lower", "upper", "relative",
+                            "effect", "probability", "corrected_probability"}) {
+    csv.title(title);
+  }
+  csv.endRow();
+  const auto optional = [&](std::optional<double> value) {
+    value ? csv.real(*value) : csv.nothing();
+  };
+  for (const Comparison& one : answer.comparisons) {
+    csv.text(one.key.name).title(kindName(one)).title(unitOf(one.key.name));
+    csv.title(one.isReal() ? "true" : "false");
+    csv.integer(one.before.devices).integer(one.after.devices);
+    csv.real(one.before.mean).real(one.after.mean).real(one.difference);
+    csv.real(one.difference - one.margin).real(one.difference + one.margin);
+    optional(one.relative);
+    optional(one.effect);
+    csv.real(one.probability).real(one.corrected).endRow();
+  }
+}
+
+}  // namespace
+
+void addCompareCommand(Command top, FleetContext& context) {
+  const Command command =
+      top.addCommand("compare", "Find the statistics that changed between two OS versions");
+  auto options = std::make_shared<CompareOptions>();
+  command.addOption("OLD", options->before, "The version before, or a part of its name")
+      .typeName("VERSION")
+      .required();
+  command.addOption("NEW", options->after, "The version after").typeName("VERSION").required();
+  addQuestionOptions(command, *options);
+  addFormOptions(command, context, *options);
+  command.addFlag("--all", options->all, "Also list the statistics that did not change");
+  command.onRun([&context, options] {
+    ask(context, *options, [&](Question& question) {
+      const CompareRequest request{question.readVersion(options->before),
+                                   question.readVersion(options->after), question.days()};
+      if (request.oldVersion == request.newVersion) {
+        throw UsageError("OLD and NEW are the same version: name two");
+      }
+      const CompareAnswer answer = compare(question.engine(), question.ledger(), request);
+      if (context.json()) return context.printJson(compareJson(answer));
+      if (options->csv) return printCsv(context.out(), answer);
+      printText(context, answer, options->all);
+    });
+  });
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,67 @@
+#include "fleet/commands/csv_writer.h"
+
+#include <array>
+#include <charconv>
+#include <cmath>
+#include <ostream>
+
+namespace tavrel::fleet {
+
+void CsvWriter::separate() {
+  if (!isFirst_) out_ << ',';
+  isFirst_ = false;
+}
+
+CsvWriter& CsvWriter::title(std::string_view value) {
+  separate();
+  if (value.find_first_of("\",\r\n") == std::string_view::npos) {
+    out_ << value;
+    return *this;
+  }
+  out_ << '"';
+  for (const char c : value) {
+    if (c == '"') out_ << '"';
+    out_ << c;
+  }
+  out_ << '"';
+  return *this;
+}
+
+CsvWriter& CsvWriter::text(std::string_view value) {
+  constexpr std::string_view kFormulas = "=+-@\t\r";
+  if (value.empty() || kFormulas.find(value.front()) == std::string_view::npos) return title(value);
+  return title("'" + std::string(value));
+}
+
+CsvWriter& CsvWriter::real(double value) {
+  separate();
+  if (!std::isfinite(value)) return *this;
+  std::array<char, 32> text;
+  const auto [end, error] = std::to_chars(text.data(), text.data() + text.size(), value);
+  out_.write(text.data(), end - text.data());
+  return *this;
+}
+
+CsvWriter& CsvWriter::integer(std::int64_t value) {
+  separate();
+  out_ << value;
+  return *this;
+}
+
+CsvWriter& CsvWriter::integer(std::uint64_t value) {
+  separate();
+  out_ << value;
+  return *this;
+}
+
+CsvWriter& CsvWriter::nothing() {
+  separate();
+  return *this;
+}
+
+void CsvWriter::endRow() {
+  out_ << "\r\n";
+  isFirst_ = true;
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,32 @@
+// Comma-separated values (RFC 4180).
+#pragma once
+
+#include <cstdint>
+#include <iosfwd>
+#include <string_view>
+
+namespace tavrel::fleet {
+
+class CsvWriter {
+ public:
+  explicit CsvWriter(std::ostream& out) : out_(out) {}
+
+  /// Texts from outside that a spreadsheet would run as a formula begin with an apostrophe.
+  CsvWriter& text(std::string_view value);
+  /// A title, or a text of our own.
+  CsvWriter& title(std::string_view value);
+  /// The shortest text that reads back to the same number; empty when it is not finite.
+  CsvWriter& real(double value);
+  CsvWriter& integer(std::int64_t value);
+  CsvWriter& integer(std::uint64_t value);
+  CsvWriter& nothing();
+  void endRow();
+
+ private:
+  void separate();
+
+  std::ostream& out_;
+  bool isFirst_ = true;
+};
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,117 @@
+#include "fleet/commands/question.h"
+
+#include <cmath>
+#include <nlohmann/json.hpp>
+
+#include "base/civil_time.h"
+#include "fleet/questions/day_range.h"
+#include "tools/shared/table.h"
+
+namespace tavrel::fleet {
+
+namespace {
+
+std::size_t devicesAtLeastOf(const QuestionOptions& options) {
+  const std::size_t wanted = options.devicesAtLeast.value_or(kDefaultDevicesAtLeast);
+  if (wanted < kFewestDevicesAtLeast) {
+    throw UsageError("--devices-at-least: " + std::to_string(wanted) +
+                     " is too few: in groups of fewer than " +
+                     std::to_string(kFewestDevicesAtLeast) +
+                     " devices, one owner can tell the figures of another");
+  }
+  return wanted;
+}
+
+}  // namespace
+
+void addQuestionOptions(Command command, QuestionOptions& options) {
+  command
+      .addOption("--days", options.days,
+                 "FIRST..LAST, one day, or a count of days up to the newest; all without it")
+      .typeName("DAYS");
+  command
+      .addOption("--devices-at-least", options.devicesAtLeast,
+                 "Show no group of fewer devices (default 10, at least 3)")
+      .typeName("K");
+}
+
+void addFormOptions(Command command, FleetContext& context, QuestionOptions& options) {
+  context.addJsonOption(command);
+  command.addFlag("--csv", options.csv, "Print comma-separated values").excludes("--json");
+}
+
+Question::Question(FleetContext& context, const QuestionOptions& options)
+    : engine_(context.openDatabase(OpenMode::kRead)),
+      table_(*engine_),
+      ledger_(table_, devicesAtLeastOf(options)) {
+  if (table_.size() == 0) {
+    throw EngineError(context.database() + ": holds no logs: load some with tavrel-fleet load");
+  }
+  if (!options.days.empty()) {
+    try {
+      days_ = readDays(options.days);
+    } catch (const UsageError& error) {
+      throw UsageError("--days: " + std::string(error.what()));
+    }
+  }
+}
+
+DayRange Question::readDays(std::string_view text) const {
+  const auto days = parseDayRange(text, table_.days().back().day);
+  if (!days) throw UsageError(days.error().message);
+  return *days;
+}
+
+std::string Question::readVersion(std::string_view text) const {
+  if (table_.number(Attribute::kOs, text)) return std::string(text);
+  const std::string* found = nullptr;
+  for (const std::string& version : table_.texts(Attribute::kOs)) {
+    if (version.find(text) == std::string::npos) continue;
+    if (found != nullptr) {
+      throw std::runtime_error("version \"" + printable(text) +
+                               "\" is part of several versions: write the whole of one of them");
+    }
+    found = &version;
+  }
+  if (found == nullptr) {
+    throw std::runtime_error("version \"" + printable(text) +
+                             "\" is in no log: tavrel-fleet summary lists the versions");
+  }
+  return *found;
+}
+
+void ask(FleetContext& context, const QuestionOptions& options,
+         const std::function<void(Question& question)>& run) {
+  try {
+    Question question(context, options);
+    run(question);
+  } catch (const UsageError& error) {
+    context.failUsage(error.what());
+  }
+}
+
+std::string tooFewText(std::size_t devicesAtLeast) {
+  return "fewer than " + std::to_string(devicesAtLeast) + " devices: nothing is shown";
+}
+
+std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAtLeast) {
+  if (joined == 0) return "";
+  const std::string why = "groups of fewer than " + std::to_string(devicesAtLeast) + " devices";
+  if (!hasGroups) return "Not divided: the parts would tell of " + why + ".";
+  return std::string(kOtherTitle) + " joins " + std::to_string(joined) +
+         " groups, so that nothing tells of " + why + ".";
+}
+
+Json realJson(double value) {
+  return std::isfinite(value) ? Json(value) : Json(nullptr);
+}
+
+Json daysJson(const DayRange& days) {
+  const DayRange all;
+  const auto day = [](std::int32_t one, std::int32_t open) {
+    return one == open ? Json(nullptr) : Json(dateText(civilFromDays(one)));
+  };
+  return {{"first", day(days.first, all.first)}, {"last", day(days.last, all.last)}};
+}
+
+}  // namespace tavrel::fleet

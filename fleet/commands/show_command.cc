@@ -1,0 +1,96 @@
+#include "fleet/commands/show_command.h"
+
+#include <nlohmann/json.hpp>
+
+#include "fleet/commands/question.h"
+#include "fleet/commands/show_output.h"
+#include "tools/shared/table.h"
+
+namespace tavrel::fleet {
+namespace {
+
+struct ShowOptions : QuestionOptions {
+  std::string key;
+  std::string by = "none";
+  std::string against;  // empty without one
+};
+
+GroupBy groupBy(const std::string& name) {
+  return name == "os"       ? GroupBy::kOs
+         : name == "region" ? GroupBy::kRegion
+         : name == "day"    ? GroupBy::kDay
+         : name == "digest" ? GroupBy::kDigest
+                            : GroupBy::kNone;
+}
+
+/// A whole version, then a range of days, then a part of a version.
+void readAgainst(const Question& question, const std::string& text, ShowRequest& request) {
+  if (!question.table().number(Attribute::kOs, text)) {
+    try {
+      request.againstDays = question.readDays(text);
+    } catch (const UsageError&) {
+      // It must be part of a version then.
+    }
+  }
+  if (!request.againstDays) {
+    request.againstVersion = question.readVersion(text);
+  } else if (request.againstDays->overlaps(request.days)) {
+    throw UsageError("--against: " + textOf(*request.againstDays) + " and " + textOf(request.days) +
+                     " overlap: name days apart with --days");
+  }
+}
+
+std::vector<ShowAnswer> answers(Question& question, const ShowOptions& options) {
+  ShowRequest request;
+  request.key = options.key;
+  request.by = groupBy(options.by);
+  request.days = question.days();
+  if (!options.against.empty()) readAgainst(question, options.against, request);
+  std::vector<ShowAnswer> result;
+  for (const Key& key : question.engine().keys()) {
+    if (key.name != options.key || key.kind == KeyKind::kHistogram) continue;
+    request.kind = key.kind;
+    result.push_back(show(question.engine(), question.ledger(), request));
+  }
+  if (result.empty()) {
+    throw std::runtime_error("statistic \"" + printable(options.key) +
+                             "\" is in no log: tavrel-fleet summary --keys lists all");
+  }
+  return result;
+}
+
+}  // namespace
+
+void addShowCommand(Command top, FleetContext& context) {
+  const Command command = top.addCommand("show", "Show how one statistic is distributed");
+  auto options = std::make_shared<ShowOptions>();
+  command.addOption("KEY", options->key, "The statistic").typeName("KEY").required();
+  command.addOption("--by", options->by, "Divide the devices")
+      .typeName("WHAT")
+      .oneOf({"none", "os", "region", "day", "digest"})
+      .showDefault();
+  command
+      .addOption("--against", options->against,
+                 "Show other days, or the logs of one OS version, beside the rest")
+      .typeName("DAYS|VERSION");
+  addQuestionOptions(command, *options);
+  addFormOptions(command, context, *options);
+  command.onRun([&context, options] {
+    ask(context, *options, [&](Question& question) {
+      const std::vector<ShowAnswer> shown = answers(question, *options);
+      if (options->csv) return printShownCsv(context.out(), shown);
+      if (context.json()) {
+        Json list = Json::array();
+        for (const ShowAnswer& answer : shown)
+          list.push_back(shownJson(answer));
+        return context.printJson({{"days", daysJson(question.days())}, {"answers", list}});
+      }
+      for (const ShowAnswer& answer : shown) {
+        if (&answer != &shown.front()) context.out() << "\n";
+        printShown(context, answer);
+      }
+    });
+  });
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,22 @@
+// The answers of tavrel-fleet show as text, JSON and CSV.
+#pragma once
+
+#include <iosfwd>
+#include <string>
+#include <vector>
+
+#include "fleet/commands/fleet_context.h"
+#include "fleet/questions/show.h"
+
+namespace tavrel::fleet {
+
+void printShown(FleetContext& context, const ShowAnswer& answer);
+Json shownJson(const ShowAnswer& answer);
+void printShownCsv(std::ostream& out, const std::vector<ShowAnswer>& answers);
+
+/// "(10, 20]", and "(20, inf)" for the last bucket, as in a log.
+std::string bucketText(double lower, double upper);
+/// "scalar" or "distribution".
+const char* kindText(const ShowAnswer& answer);
+
+}  // namespace tavrel::fleet

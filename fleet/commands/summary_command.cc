@@ -1,0 +1,178 @@
+#include "fleet/commands/summary_command.h"
+
+#include <nlohmann/json.hpp>
+#include <ostream>
+
+#include "base/civil_time.h"
+#include "catalogue/catalogue.h"
+#include "fleet/commands/csv_writer.h"
+#include "fleet/commands/question.h"
+#include "fleet/questions/summary.h"
+#include "tools/shared/table.h"
+
+namespace tavrel::fleet {
+namespace {
+
+struct SummaryOptions : QuestionOptions {
+  bool keys = false;
+};
+
+struct PartName {
+  GroupBy by;
+  const char* name;   // in JSON and CSV
+  const char* title;  // of the column
+};
+constexpr PartName kParts[] = {{GroupBy::kOs, "os", "OS VERSION"},
+                               {GroupBy::kRegion, "region", "REGION"},
+                               {GroupBy::kDigest, "digest", "WHITELIST"},
+                               {GroupBy::kDay, "day", "DAY"}};
+
+const PartName& nameOf(GroupBy by) {
+  for (const PartName& part : kParts) {
+    if (part.by == by) return part;
+  }
+  return kParts[0];
+}
+
+std::string date(std::int32_t day) {
+  return dateText(civilFromDays(day));
+}
+
+const char* kindName(KeyKind kind) {
+  return kind == KeyKind::kScalar         ? "scalar"
+         : kind == KeyKind::kDistribution ? "distribution"
+                                          : "histogram";
+}
+
+void printText(FleetContext& context, const SummaryAnswer& answer) {
+  std::ostream& out = context.out();
+  if (!answer.isShown) {
+    out << "All logs: " << tooFewText(answer.devicesAtLeast) << "\n";
+    return;
+  }
+  out << "Logs        " << answer.whole.logs << ", " << date(answer.whole.firstDay) << " to "
+      << date(answer.whole.lastDay) << "\n"
+      << "Devices     at least " << answer.whole.devices << "\n"
+      << "Statistics  " << counted(answer.scalarKeys, "scalar") << ", "
+      << counted(answer.distributionKeys, "distribution") << ", "
+      << counted(answer.histogramKeys, "histogram") << "\n";
+  for (const SummaryPart& part : answer.parts) {
+    out << "\n";
+    using Align = Table::Align;
+    Table table({{nameOf(part.by).title},
+                 {"DEVICES", Align::Right},
+                 {"LOGS", Align::Right},
+                 {"FIRST DAY"},
+                 {"LAST DAY"}});
+    for (const CountedGroup& group : part.groups) {
+      table.add({group.title, std::to_string(group.devices), std::to_string(group.logs),
+                 date(group.firstDay), date(group.lastDay)});
+    }
+    if (!table.empty()) table.print(context.page());
+    const std::string joined = joinedText(part.joined, !part.groups.empty(), answer.devicesAtLeast);
+    if (table.empty()) out << nameOf(part.by).title << "\n";
+    if (!joined.empty()) out << joined << "\n";
+  }
+}
+
+Json groupJson(const CountedGroup& group) {
+  return {{"title", group.title},
+          {"devices", group.devices},
+          {"logs", group.logs},
+          {"first_day", date(group.firstDay)},
+          {"last_day", date(group.lastDay)}};
+}
+
+Json summaryJson(const SummaryAnswer& answer) {
+  Json json = {{"devices_at_least", answer.devicesAtLeast},
+               {"days", daysJson(answer.days)},
+               {"shown", answer.isShown}};
+  if (!answer.isShown) return json;
+  json["all"] = groupJson(answer.whole);
+  for (const SummaryPart& part : answer.parts) {
+    Json groups = Json::array();
+    for (const CountedGroup& group : part.groups)
+      groups.push_back(groupJson(group));
+    json["by"][nameOf(part.by).name] = {{"groups", std::move(groups)}, {"joined", part.joined}};
+  }
+  json["statistics"] = {{"scalars", answer.scalarKeys},
+                        {"distributions", answer.distributionKeys},
+                        {"histograms", answer.histogramKeys}};
+  return json;
+}
+
+void printCsv(std::ostream& out, const SummaryAnswer& answer) {
+  CsvWriter csv(out);
+  csv.title("by")
+      .title("group")
+      .title("devices")
+      .title("logs")
+      .title("first_day")
+      .title("last_day");
+  csv.endRow();
+  const auto row = [&](const char* by, const CountedGroup& group) {
+    csv.title(by).text(group.title).integer(group.devices).integer(group.logs);
+    csv.title(date(group.firstDay)).title(date(group.lastDay)).endRow();
+  };
+  if (!answer.isShown) return;
+  row("none", answer.whole);
+  for (const SummaryPart& part : answer.parts) {
+    for (const CountedGroup& group : part.groups)
+      row(nameOf(part.by).name, group);
+  }
+}
+
+void printKeys(FleetContext& context, const QuestionOptions& options,
+               const std::vector<Key>& keys) {
+  const auto entryOf = [](const Key& key) {
+    const catalogue::Entry* entry = catalogue::findStatistic(key.name);
+    return entry != nullptr ? *entry : catalogue::Entry{};
+  };
+  if (context.json()) {
+    Json list = Json::array();
+    for (const Key& key : keys) {
+      const catalogue::Entry entry = entryOf(key);
+      list.push_back({{"key", key.name},
+                      {"kind", kindName(key.kind)},
+                      {"unit", entry.unit},
+                      {"meaning", entry.meaning}});
+    }
+    return context.printJson({{"keys", std::move(list)}});
+  }
+  if (options.csv) {
+    CsvWriter csv(context.out());
+    csv.title("key").title("kind").title("unit").title("meaning").endRow();
+    for (const Key& key : keys) {
+      const catalogue::Entry entry = entryOf(key);
+      csv.text(key.name).title(kindName(key.kind)).title(entry.unit).title(entry.meaning).endRow();
+    }
+    return;
+  }
+  Table table({{"KEY"}, {"KIND"}, {"UNIT"}, {"MEANING"}});
+  for (const Key& key : keys) {
+    const catalogue::Entry entry = entryOf(key);
+    table.add({key.name, kindName(key.kind), std::string(entry.unit), std::string(entry.meaning)});
+  }
+  table.print(context.page());
+}
+
+}  // namespace
+
+void addSummaryCommand(Command top, FleetContext& context) {
+  const Command summary = top.addCommand("summary", "Tell what logs there are, and of what");
+  auto options = std::make_shared<SummaryOptions>();
+  addQuestionOptions(summary, *options);
+  addFormOptions(summary, context, *options);
+  summary.addFlag("--keys", options->keys, "List all statistics instead");
+  summary.onRun([&context, options] {
+    ask(context, *options, [&](Question& question) {
+      if (options->keys) return printKeys(context, *options, question.engine().keys());
+      const SummaryAnswer answer = summarise(question.engine(), question.ledger(), question.days());
+      if (context.json()) return context.printJson(summaryJson(answer));
+      if (options->csv) return printCsv(context.out(), answer);
+      printText(context, answer);
+    });
+  });
+}
+
+}  // namespace tavrel::fleet

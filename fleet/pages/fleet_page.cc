@@ -1,0 +1,123 @@
+#include "fleet/pages/fleet_page.h"
+
+#include <algorithm>
+#include <set>
+
+#include "base/civil_time.h"
+#include "fleet/pages/sections.h"
+#include "page/document.h"
+
+namespace tavrel::fleet {
+
+namespace {
+
+/// More make a page that nobody reads; `tavrel-fleet show` tells of each.
+constexpr std::size_t kMostStatistics = 40;
+
+/// Whether a scalar tells how worn a drive is: docs/catalogue/channels.md and nand.md.
+bool tellsOfWear(const Key& key) {
+  if (key.kind != KeyKind::kScalar) return false;
+  for (const std::string_view end :
+       {".used_pct", ".life_a_pct", ".life_b_pct", ".erases_max", ".waf_milli", ".spare_pct",
+        ".AverageCycle", ".HottestCycle"}) {
+    if (key.name.ends_with(end)) return true;
+  }
+  return false;
+}
+
+ShowAnswer askAbout(Engine& engine, Ledger& ledger, const Key& key, const DayRange& days) {
+  ShowRequest request;
+  request.key = key.name;
+  request.kind = key.kind;
+  request.by = GroupBy::kOs;
+  request.days = days;
+  return show(engine, ledger, request);
+}
+
+}  // namespace
+
+FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
+  FleetPage page;
+  page.summary = summarise(engine, ledger, days);
+  if (!page.summary.isShown) return page;
+  if (const auto versions = newestVersions(ledger, days)) {
+    page.comparison = compare(engine, ledger, {versions->first, versions->second, days});
+  }
+
+  // What changed most comes first, then distributions, then scalars.
+  std::vector<Key> others;
+  const auto add = [&](const Key& key) {
+    if (tellsOfWear(key)) {
+      page.wear.push_back(askAbout(engine, ledger, key, days));
+    } else {
+      others.push_back(key);
+    }
+  };
+  std::set<std::pair<KeyKind, std::string>> known;
+  if (page.comparison) {
+    for (const Comparison& one : page.comparison->comparisons) {
+      if (!one.isReal()) break;
+      known.emplace(one.key.kind, one.key.name);
+      add(one.key);
+    }
+  }
+  const std::vector<Key> keys = engine.keys();
+  for (const KeyKind kind : {KeyKind::kDistribution, KeyKind::kScalar}) {
+    for (const Key& key : keys) {
+      if (key.kind == kind && !known.contains({key.kind, key.name})) add(key);
+    }
+  }
+  if (others.size() > kMostStatistics) {
+    page.furtherStatistics = others.size() - kMostStatistics;
+    others.resize(kMostStatistics);
+  }
+  for (const Key& key : others)
+    page.statistics.push_back(askAbout(engine, ledger, key, days));
+  return page;
+}
+
+std::string textOf(const FleetPage& page) {
+  const SummaryAnswer& summary = page.summary;
+  page::Document document("Fleet");
+  if (!summary.isShown) {
+    document.head().element("p", "There are fewer than " + countText(summary.devicesAtLeast) +
+                                     " devices on these days: nothing is shown.");
+    return document.text();
+  }
+  document.head().element("p", dateText(civilFromDays(summary.whole.firstDay)) + " to " +
+                                   dateText(civilFromDays(summary.whole.lastDay)) + ", at least " +
+                                   countText(summary.whole.devices) + " devices, " +
+                                   countText(summary.whole.logs) + " daily logs");
+  writeInShort(document.section("In short"), page);
+  if (page.comparison)
+    writeChanges(document.section("What the newest version changed"), *page.comparison);
+  if (!page.wear.empty()) writeStatistics(document.section("Wear of the flash"), page.wear);
+  writeFleet(document.section("The fleet"), summary);
+  if (!page.statistics.empty()) {
+    page::HtmlWriter& html = document.section("Statistics by version");
+    writeStatistics(html, page.statistics);
+    if (page.furtherStatistics != 0) {
+      html.element("p",
+                   "There are " + countText(page.furtherStatistics) +
+                       " more statistics; tavrel-fleet show tells of each.",
+                   {{"class", "note"}});
+    }
+  }
+  page::HtmlWriter& html = document.section("How to read this page");
+  html.element("p",
+               "A log is one day of one device and does not say which device it is of. So nobody "
+               "can count devices; \"at least\" so many are those that reported on the best day.");
+  html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
+                        " devices are not shown by themselves. They are joined as \"" +
+                        std::string(kOtherTitle) +
+                        "\", and where they could be told by a subtraction, so is the next larger "
+                        "group. Buckets of histograms are joined in the same way.");
+  html.element("p",
+               "A change is called one only when a difference of its size would come about by "
+               "chance in fewer than one of twenty such comparisons of all statistics together. "
+               "Versions ran on different days and on devices that chose to update: what differs "
+               "between them need not be their doing.");
+  return document.text();
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,26 @@
+// The sections of a fleet's page.
+#pragma once
+
+#include <string>
+#include <string_view>
+
+#include "fleet/pages/fleet_page.h"
+#include "page/html_writer.h"
+
+namespace tavrel::fleet {
+
+/// The most important facts in sentences.
+void writeInShort(page::HtmlWriter& html, const FleetPage& page);
+void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary);
+void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison);
+void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers);
+
+/// What a key means, in short, when that is known; else the key.
+std::string nameOf(std::string_view key);
+std::string_view unitOf(std::string_view key);
+/// "20 % higher (120 ms → 144 ms)".
+std::string changeText(const Comparison& one);
+/// "1,234".
+std::string countText(std::size_t count);
+
+}  // namespace tavrel::fleet

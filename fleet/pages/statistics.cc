@@ -1,0 +1,162 @@
+// The fleet's parts, and statistics by version.
+#include <algorithm>
+#include <cmath>
+
+#include "base/civil_time.h"
+#include "fleet/pages/sections.h"
+#include "fleet/questions/merged_numbers.h"
+#include "page/charts.h"
+#include "page/number_text.h"
+#include "page/table.h"
+
+namespace tavrel::fleet {
+
+namespace {
+
+void writeGroups(page::HtmlWriter& html, const char* title, const SummaryPart& part,
+                 std::size_t devicesAtLeast) {
+  html.element("h3", title);
+  std::vector<page::Bar> bars;
+  for (const CountedGroup& group : part.groups) {
+    bars.push_back(
+        {group.title, static_cast<double>(group.devices), countText(group.devices) + " devices"});
+  }
+  if (!bars.empty()) {
+    writeBars(html, title, bars);
+  } else {
+    html.element("p",
+                 "Not divided: there would be groups of fewer than " + countText(devicesAtLeast) +
+                     " devices.",
+                 {{"class", "note"}});
+  }
+}
+
+std::string intervalText(const Interval& interval, std::string_view unit) {
+  if (std::isinf(interval.lower) && std::isinf(interval.upper)) return "not known";
+  if (std::isinf(interval.lower)) return "up to " + page::figureText(interval.upper, unit);
+  if (std::isinf(interval.upper)) return "above " + page::figureText(interval.lower, unit);
+  return page::figureText(interval.lower, unit) + " to " + page::figureText(interval.upper, unit);
+}
+
+std::string percentileText(const ShownSet& set, std::size_t index, std::string_view unit) {
+  if (set.scalar)
+    return page::figureText(static_cast<double>(set.scalar->percentiles[index]), unit);
+  if (index >= set.histogram.percentiles.size()) return "";
+  return intervalText(set.histogram.percentiles[index], unit);
+}
+
+std::string meanText(const ShownSet& set, std::string_view unit) {
+  const double mean = set.scalar ? set.scalar->mean : set.merged.value_or(FiveNumbers{}).mean;
+  return std::isfinite(mean) ? page::figureText(mean, unit) : "";
+}
+
+void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& name,
+               std::string_view unit) {
+  const bool hasPercentiles = side.whole.scalar || !side.whole.histogram.percentiles.empty();
+  using Align = page::Table::Align;
+  std::vector<page::Table::Column> columns = {
+      {"Version", Align::Name}, {"Devices", Align::Number}, {"Mean", Align::Number}};
+  if (hasPercentiles) {
+    for (const unsigned percent : kPercents) {
+      columns.push_back(
+          {percent == 50 ? "Median" : std::to_string(percent) + " % up to", Align::Number});
+    }
+  }
+  page::Table table(html, name, std::move(columns));
+  const auto row = [&](const ShownSet& set) {
+    table.row();
+    table.cell([&](page::HtmlWriter& cell) { cell.name(set.title); });
+    table.cell(countText(set.devices));
+    table.cell(meanText(set, unit));
+    for (std::size_t i = 0; i < kPercents.size() && hasPercentiles; ++i) {
+      table.cell(percentileText(set, i, unit));
+    }
+  };
+  for (const ShownSet& group : side.groups)
+    row(group);
+  if (side.groups.size() != 1) row(side.whole);
+  table.end();
+}
+
+/// Buckets may be joined to different widths, so each stands in a row with its own label.
+void writeHistogramOf(page::HtmlWriter& html, const ShownSet& set, const std::string& name) {
+  std::vector<page::Bar> bars;
+  for (const Piece& piece : set.histogram.pieces) {
+    std::string count = countText(piece.least);
+    if (piece.least != piece.most) count += " to " + countText(piece.most);
+    bars.push_back(
+        {intervalText({piece.lower, piece.upper}, ""), static_cast<double>(piece.least), count});
+  }
+  if (bars.size() < 2) return;
+  html.begin("div", {{"class", "card"}});
+  html.begin("h3");
+  html.name(set.title);
+  html.end();
+  writeBars(html, name + ", " + set.title, bars);
+  html.end();
+}
+
+}  // namespace
+
+std::string countText(std::size_t count) {
+  std::string text = std::to_string(count);
+  for (std::size_t place = text.size(); place > 3; place -= 3)
+    text.insert(place - 3, ",");
+  return text;
+}
+
+void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
+  for (const SummaryPart& part : summary.parts) {
+    if (part.by == GroupBy::kOs) writeGroups(html, "OS versions", part, summary.devicesAtLeast);
+    if (part.by == GroupBy::kRegion) writeGroups(html, "Regions", part, summary.devicesAtLeast);
+    if (part.by != GroupBy::kDay) continue;
+    page::LineChart chart;
+    chart.name = "Devices by day";
+    chart.text = [](double value) { return page::shortNumber(value); };
+    std::int32_t next = summary.whole.firstDay;
+    for (const CountedGroup& group : part.groups) {
+      if (group.title == kOtherTitle) continue;
+      for (; next < group.firstDay; ++next)
+        chart.values.push_back(std::nullopt);
+      chart.values.push_back(static_cast<double>(group.devices));
+      next = group.firstDay + 1;
+    }
+    if (chart.values.size() < 2) continue;
+    chart.first = dateText(civilFromDays(summary.whole.firstDay));
+    chart.last = dateText(civilFromDays(next - 1));
+    html.element("h3", "Devices that reported, by day");
+    writeLineChart(html, chart);
+  }
+}
+
+void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers) {
+  std::size_t hidden = 0;
+  for (const ShowAnswer& answer : answers) {
+    const ShowSide& side = answer.sides.front();
+    if (!side.isShown) {
+      ++hidden;
+      continue;
+    }
+    const std::string name = nameOf(answer.request.key);
+    const std::string_view unit = unitOf(answer.request.key);
+    html.begin("h3");
+    html.name(name);
+    html.end();
+    html.begin("p", {{"class", "note"}});
+    html.name(name == answer.request.key ? "" : answer.request.key);
+    if (!unit.empty()) html.text(", in " + std::string(unit));
+    html.end();
+    writeSets(html, side, name, unit);
+    html.begin("div", {{"class", "cards"}});
+    if (side.groups.empty()) writeHistogramOf(html, side.whole, name);
+    for (const ShownSet& group : side.groups)
+      writeHistogramOf(html, group, name);
+    html.end();
+  }
+  if (hidden != 0) {
+    html.element("p", countText(hidden) + " statistics are of too few devices to be shown.",
+                 {{"class", "note"}});
+  }
+}
+
+}  // namespace tavrel::fleet
