@@ -34,14 +34,6 @@ struct FoldedSegment {
   bool isOver;  // nobody can write to it, and nothing is left in it
 };
 
-Status giveTo(SqliteBatch& batch, const SegmentIntake& intake) {
-  Status done = Done{};
-  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
-    if (done) done = batch.appendValues(day, key, samples);
-  });
-  return done;
-}
-
 class FoldRun {
  public:
   FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
@@ -68,7 +60,6 @@ class FoldRun {
   const BootInstant boot_ = currentBootInstant();
 
   FoldedRows rows_;
-  SampleBuffers buffers_;
   std::optional<SegmentNames> known_;               // whose positions the store holds
   std::map<std::uint32_t, std::size_t> positions_;  // of each user
   SegmentNames found_;
@@ -214,9 +205,9 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     }
     return Done{};
   }
-  SegmentIntake intake(name.owner, recorders_, rows_, changes_, buffers_);
+  SegmentIntake intake(name.owner, recorders_, rows_, changes_, batch.waitingDistributions());
   SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
-  if (Status done = giveTo(batch, intake); !done) return done;
+  if (Status done = batch.limitWaiting(); !done) return done;
   const bool isOver = isWriterGone && progress.isComplete;
   if (isOver) position = SegmentPosition::end();
   if (const std::string after = position.encode(); after != before) {

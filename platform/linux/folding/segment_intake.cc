@@ -49,13 +49,11 @@ void SegmentIntake::takeScalar(const SegmentScalar& scalar) {
   changes_.set(scalar.day, scalar.key, scalar.value, row->added);
 }
 
-std::uint32_t SegmentIntake::findSeries(const SegmentRecord& record) {
-  const auto [found, isNew] = places_.try_emplace({record.keyNumber, record.day},
-                                                  static_cast<std::uint32_t>(series_.size()));
-  if (isNew) {
-    const bool isTaken = mayTake(record.key, record.day) &&
-                         rows_.find(user_, record.day, record.key, false) != nullptr;
-    series_.push_back({record.key, record.day, !isTaken});
+SegmentIntake::Series* SegmentIntake::findSeries(const SegmentRecord& record) {
+  const auto [found, isNew] = series_.try_emplace({record.keyNumber, record.day}, nullptr);
+  if (isNew && mayTake(record.key, record.day) &&
+      rows_.find(user_, record.day, record.key, false) != nullptr) {
+    found->second = &distributions_.series(record.day, record.key);
   }
   return found->second;
 }
@@ -63,28 +61,12 @@ std::uint32_t SegmentIntake::findSeries(const SegmentRecord& record) {
 void SegmentIntake::takeRecord(const SegmentRecord& record) {
   if (recent_.empty()) recent_.resize(kBHKeys + 1);
   RecentSeries& recent = recent_[record.keyNumber];
-  if (recent.day != record.day || recent.place == kNone) {
-    recent = {record.day, findSeries(record)};
+  if (recent.day != record.day || !recent.isKnown) {
+    recent = {record.day, true, findSeries(record)};
   }
-  Series& series = series_[recent.place];
-  if (series.isRefused) return void(++refused_);
-  ++series.count;
-  buffers_.recorded_.push_back({record.value, record.secondsInDay, recent.place});
-}
-
-std::span<const DistributionSample> SegmentIntake::samplesBySeries() const {
-  std::vector<std::size_t> next;  // of each series, the place of its next sample
-  next.reserve(series_.size());
-  std::size_t count = 0;
-  for (const Series& series : series_) {
-    next.push_back(count);
-    count += series.count;
-  }
-  std::vector<DistributionSample>& sorted = buffers_.bySeries_;
-  if (sorted.size() < count) sorted.resize(count);
-  for (const SampleBuffers::Sample& sample : buffers_.recorded_)
-    sorted[next[sample.series]++] = {sample.value, sample.secondsInDay};
-  return std::span(sorted).first(count);
+  if (recent.series == nullptr) return void(++refused_);
+  ++values_;
+  distributions_.append(*recent.series, record.value, record.secondsInDay);
 }
 
 }  // namespace tavrel

@@ -42,7 +42,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
   for (const auto& [owner, count] : listing->leftOut)
     waiting.leftOut_ += count;
   FoldedRows rows;
-  SampleBuffers buffers;
+  PendingDistributions buffer;
   for (const SegmentEntry& entry : listing->segments) {
     if (waiting.blocks_ >= limits::kWaitingBlocks ||
         waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
@@ -52,7 +52,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
     const auto segment = folder.openSegment(entry);
     // The fold tells what is refused.
     if (!segment || !*segment) continue;
-    if (Status added = waiting.add(**segment, recorders, history, selection, rows, buffers);
+    if (Status added = waiting.add(**segment, recorders, history, selection, rows, buffer);
         !added) {
       return added.error();
     }
@@ -62,7 +62,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
 
 Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders,
                           SqliteHistory* history, const RowSelection& selection, FoldedRows& rows,
-                          SampleBuffers& buffers) {
+                          PendingDistributions& buffer) {
   SegmentReader reader(segment.file.get());
   const SegmentFacts facts = reader.facts();
   // A lease could be in the way of a fold.
@@ -80,31 +80,38 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
       if (position.isEnd) return Done{};
     }
   }
-  SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffers);
+  SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffer);
   SelectingSink sink(selection, intake);
   reader.read(position, currentBootInstant(), isWriterGone, sink);
   Status added = Done{};
-  intake.eachSeries([&](std::int32_t day, std::string_view key, const auto& samples) {
-    if (added) added = addSeries(selection, day, key, samples);
+  buffer.each([&](std::int32_t day, std::string_view key, const DistributionBlock& block) {
+    if (added) added = addSeries(selection, day, key, block);
   });
+  buffer.clear();
   return added;
 }
 
 Status WaitingValues::addSeries(const RowSelection& selection, std::int32_t day,
-                                std::string_view key, std::span<const DistributionSample> samples) {
+                                std::string_view key, const DistributionBlock& block) {
   auto found = distributions_.find(std::pair(day, key));
   if (found == distributions_.end()) {
     found = distributions_.emplace(RowName(day, key), Series()).first;
   }
   Series& series = found->second;
-  series.count += std::ssize(samples);
+  const std::size_t count = block.values.size() / kPackedValueBytes;
+  series.count += static_cast<std::int64_t>(count);
   if (!selection.hasValues) return Done{};
-  if (::write(copied_.get(), samples.data(), samples.size_bytes()) !=
-      static_cast<ssize_t>(samples.size_bytes())) {
+  std::vector<DistributionSample> samples(count);
+  for (std::size_t i = 0; i < count; ++i) {
+    samples[i] = {packedValueAt(block.values.data() + i * kPackedValueBytes),
+                  packedOffsetAt(block.offsets.data() + i * kPackedOffsetBytes)};
+  }
+  const auto bytes = std::as_bytes(std::span(samples));
+  if (::write(copied_.get(), bytes.data(), bytes.size()) != std::ssize(bytes)) {
     return systemError("copy", "segments");
   }
-  series.blocks.push_back({copies_, samples.size()});
-  copies_ += samples.size();
+  series.blocks.push_back({copies_, count});
+  copies_ += count;
   ++blocks_;
   return Done{};
 }

@@ -62,9 +62,9 @@ class WaitingValues {
  private:
   WaitingValues() = default;
   Status add(const OpenSegment& segment, const Recorders& recorders, SqliteHistory* history,
-             const RowSelection& selection, FoldedRows& rows, SampleBuffers& buffers);
+             const RowSelection& selection, FoldedRows& rows, PendingDistributions& buffer);
   Status addSeries(const RowSelection& selection, std::int32_t day, std::string_view key,
-                   std::span<const DistributionSample> samples);
+                   const DistributionBlock& block);
 
   ScalarChanges scalars_;
   RowMap<Series> distributions_;

@@ -11,6 +11,13 @@ namespace {
 // The memory of a distribution, without its values.
 constexpr std::size_t kSeriesBytes = 256;
 
+// Values of a distribution's first piece, and at most of a later one. Each has room for twice as
+// many as the one before, so that few values take little memory.
+constexpr std::uint32_t kFewest = 8;
+constexpr std::uint32_t kMost = 512;
+
+constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
+
 }  // namespace
 
 std::size_t PendingDistributions::HashName::operator()(const Name& name) const {
@@ -19,42 +26,35 @@ std::size_t PendingDistributions::HashName::operator()(const Name& name) const {
          static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
 }
 
-PendingDistributions::Series& PendingDistributions::find(const Name& name) {
+PendingDistributions::Series& PendingDistributions::series(std::int32_t day, std::string_view key) {
+  const Name name{day, key};
   if (last_ != nullptr && last_->first == name) return last_->second;
   auto found = series_.find(name);
   if (found == series_.end()) {
-    auto key = std::make_unique<const std::string>(name.key);
-    const Name owned{name.day, *key};
-    found = series_.emplace(owned, Series{std::move(key), {}}).first;
-    bytes_ += kSeriesBytes + name.key.size();
+    auto kept = std::make_unique<const std::string>(key);
+    found = series_.try_emplace(Name{day, *kept}).first;
+    found->second.key_ = std::move(kept);
+    bytes_ += kSeriesBytes + key.size();
   }
   last_ = &*found;
   return found->second;
 }
 
+void PendingDistributions::grow(Series& series) {
+  const std::uint32_t capacity =
+      series.pieces_.empty() ? kFewest : std::min(2 * series.pieces_.back().capacity, kMost);
+  series.value_ = memory_.take(capacity * kSampleBytes);
+  series.offset_ = series.value_ + capacity * kPackedValueBytes;
+  series.room_ = capacity;
+  series.pieces_.push_back({series.value_, capacity});
+  bytes_ += capacity * kSampleBytes + sizeof(Piece);
+}
+
 void PendingDistributions::append(std::int32_t day, std::string_view key,
                                   std::span<const DistributionSample> samples) {
-  std::vector<Piece>& pieces = find({day, key}).pieces;
-  while (!samples.empty()) {
-    const std::size_t number = samples_ / Block::kSamples;
-    const std::size_t first = samples_ % Block::kSamples;
-    if (number == blocks_.size()) blocks_.push_back(std::make_unique_for_overwrite<Block>());
-    Block& block = *blocks_[number];
-    const auto taken = samples.first(std::min(samples.size(), Block::kSamples - first));
-    pack(taken, MutableByteSpan(block.values).subspan(first * kPackedValueBytes),
-         MutableByteSpan(block.offsets).subspan(first * kPackedOffsetBytes));
-    if (!pieces.empty() && pieces.back().block == number &&
-        pieces.back().first + pieces.back().count == first) {
-      pieces.back().count += static_cast<std::uint32_t>(taken.size());
-    } else {
-      pieces.push_back(
-          {number, static_cast<std::uint32_t>(first), static_cast<std::uint32_t>(taken.size())});
-      bytes_ += sizeof(Piece);
-    }
-    samples_ += taken.size();
-    bytes_ += taken.size() * kSampleBytes;
-    samples = samples.subspan(taken.size());
-  }
+  Series& to = series(day, key);
+  for (const DistributionSample& sample : samples)
+    append(to, sample.value, sample.secondsInDayOffset);
 }
 
 std::vector<const PendingDistributions::Entry*> PendingDistributions::sorted() const {
@@ -68,25 +68,22 @@ std::vector<const PendingDistributions::Entry*> PendingDistributions::sorted() c
   return entries;
 }
 
-void PendingDistributions::gather(const Series& series, std::string& values,
-                                  std::string& offsets) const {
+void PendingDistributions::gather(const Series& series, std::string& values, std::string& offsets) {
   values.clear();
   offsets.clear();
-  for (const Piece& piece : series.pieces) {
-    const Block& block = *blocks_[piece.block];
-    values +=
-        asText(ByteSpan(block.values)
-                   .subspan(piece.first * kPackedValueBytes, piece.count * kPackedValueBytes));
-    offsets +=
-        asText(ByteSpan(block.offsets)
-                   .subspan(piece.first * kPackedOffsetBytes, piece.count * kPackedOffsetBytes));
+  for (const Piece& piece : series.pieces_) {
+    const bool isLast = &piece == &series.pieces_.back();
+    const std::size_t count = piece.capacity - (isLast ? series.room_ : 0);
+    values += asText(ByteSpan(piece.values, count * kPackedValueBytes));
+    offsets += asText(
+        ByteSpan(piece.values + piece.capacity * kPackedValueBytes, count * kPackedOffsetBytes));
   }
 }
 
 void PendingDistributions::clear() {
   last_ = nullptr;
   series_.clear();
-  samples_ = 0;
+  memory_.reuse();
   bytes_ = 0;
 }
 

@@ -1,7 +1,7 @@
 // Values of distributions that wait to be written, so that each row is written once.
 //
 //   PendingDistributions pending;
-//   pending.append(day, key, samples);
+//   pending.append(pending.series(day, key), value, secondsInDay);
 //   pending.each([&](std::int32_t day, std::string_view key, const DistributionBlock& block) { ...
 //   }); pending.clear();
 #pragma once
@@ -16,14 +16,39 @@
 #include <vector>
 
 #include "platform/distribution_values.h"
+#include "platform/linux/store/sample_memory.h"
 
 namespace tavrel {
 
 class PendingDistributions {
- public:
-  /// What a waiting value takes of memory. A distribution takes some more.
-  static constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
+  // Values of one distribution that were recorded one after the other, their offsets behind them.
+  struct Piece {
+    std::byte* values;
+    std::uint32_t capacity;
+  };
 
+ public:
+  /// The values of one distribution.
+  class Series {
+    friend class PendingDistributions;
+    std::unique_ptr<const std::string> key_;
+    std::vector<Piece> pieces_;
+    // Where the next one goes in the last piece, and how many more it takes.
+    std::byte* value_ = nullptr;
+    std::byte* offset_ = nullptr;
+    std::uint32_t room_ = 0;
+  };
+
+  /// Stays in place until `clear`.
+  Series& series(std::int32_t day, std::string_view key);
+  void append(Series& series, double value, std::uint32_t secondsInDayOffset) {
+    if (series.room_ == 0) grow(series);
+    storeLittle64({series.value_, kPackedValueBytes}, 0, std::bit_cast<std::uint64_t>(value));
+    storeLittle32({series.offset_, kPackedOffsetBytes}, 0, secondsInDayOffset);
+    series.value_ += kPackedValueBytes;
+    series.offset_ += kPackedOffsetBytes;
+    --series.room_;
+  }
   void append(std::int32_t day, std::string_view key, std::span<const DistributionSample> samples);
 
   /// Passes all on, by day and then by key, the values of each in the order of `append`. The blocks
@@ -34,7 +59,9 @@ class PendingDistributions {
     std::string offsets;
     for (const Entry* entry : sorted()) {
       gather(entry->second, values, offsets);
-      take(entry->first.day, entry->first.key, DistributionBlock{values, offsets});
+      if (!values.empty()) {
+        take(entry->first.day, entry->first.key, DistributionBlock{values, offsets});
+      }
     }
   }
   /// Keeps memory for what comes next.
@@ -45,19 +72,6 @@ class PendingDistributions {
   std::size_t bytes() const { return bytes_; }
 
  private:
-  // Values in the order of their arrival, of any distribution: what waits is copied once, and no
-  // growing buffer leaves pages behind that were touched in vain.
-  struct Block {
-    static constexpr std::size_t kSamples = 4096;
-    std::byte values[kSamples * kPackedValueBytes];
-    std::byte offsets[kSamples * kPackedOffsetBytes];
-  };
-  // Values of one distribution that follow each other in a block.
-  struct Piece {
-    std::size_t block;
-    std::uint32_t first;
-    std::uint32_t count;
-  };
   struct Name {
     std::int32_t day = 0;
     std::string_view key;  // of the series
@@ -66,21 +80,16 @@ class PendingDistributions {
   struct HashName {
     std::size_t operator()(const Name& name) const;
   };
-  struct Series {
-    std::unique_ptr<const std::string> key;
-    std::vector<Piece> pieces;
-  };
   using Map = std::unordered_map<Name, Series, HashName>;
   using Entry = Map::value_type;
 
-  Series& find(const Name& name);
+  void grow(Series& series);
   std::vector<const Entry*> sorted() const;
-  void gather(const Series& series, std::string& values, std::string& offsets) const;
+  static void gather(const Series& series, std::string& values, std::string& offsets);
 
   Map series_;
   Entry* last_ = nullptr;  // values of one distribution often follow each other
-  std::vector<std::unique_ptr<Block>> blocks_;
-  std::size_t samples_ = 0;  // in the blocks
+  SampleMemory memory_;
   std::size_t bytes_ = 0;
 };
 

@@ -39,8 +39,8 @@ struct SqliteBatch::Statements {
 
 SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site)
     : connection_(std::move(connection)), site_(site), kept_(site.path) {
-  // A large import changes many pages.
-  connection_.execute("PRAGMA cache_size = -8192");
+  // Rows are written in the order of their keys, so that few pages are changed again and again.
+  connection_.execute("PRAGMA cache_size = -2048");
 }
 
 void SqliteBatch::begin() {
@@ -188,7 +188,7 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
   // As many as wait at most, so that a large span is no exception.
-  constexpr std::size_t kAtOnce = kPendingBytes / PendingDistributions::kSampleBytes;
+  constexpr std::size_t kAtOnce = kPendingBytes / (kPackedValueBytes + kPackedOffsetBytes);
   try {
     checkKey(key);
     while (!samples.empty()) {
@@ -197,6 +197,15 @@ Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
       if (distributions_.bytes() >= kPendingBytes) writeDistributions();
       samples = samples.subspan(taken.size());
     }
+  } catch (const StoreFailure& failure) {
+    return describe(failure);
+  }
+  return Done{};
+}
+
+Status SqliteBatch::limitWaiting() {
+  try {
+    if (distributions_.bytes() >= kPendingBytes) writeDistributions();
   } catch (const StoreFailure& failure) {
     return describe(failure);
   }

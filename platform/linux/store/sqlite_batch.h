@@ -50,6 +50,11 @@ class SqliteBatch {
                      double value);
   Status appendValues(std::int32_t day, std::string_view key,
                       std::span<const DistributionSample> samples);
+  /// The values that wait, for whoever appends many one by one to keys that are short enough.
+  /// `limitWaiting` belongs behind some 200,000 of them at most.
+  PendingDistributions& waitingDistributions() { return distributions_; }
+  /// Writes them when they take too much memory.
+  Status limitWaiting();
 
   /// How far a segment was folded, as an earlier batch stored it; nothing when unknown. From this
   /// call on other writers wait, so that nobody else folds the segment until the commit.

@@ -1,0 +1,67 @@
+#include "platform/linux/store/sample_memory.h"
+
+#include <algorithm>
+#include <cstdint>
+#include <new>
+#include <sys/mman.h>
+
+namespace tavrel {
+namespace {
+
+constexpr std::size_t kSmallest = 64U << 10;
+constexpr std::size_t kLargest = 2U << 20;
+constexpr std::size_t kAlignment = 16;
+
+// Of a huge page, an address where one can begin.
+std::byte* map(std::size_t bytes) {
+  const std::size_t mapped = bytes == kLargest ? 2 * bytes : bytes;
+  void* const address =
+      mmap(nullptr, mapped, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  if (address == MAP_FAILED) throw std::bad_alloc();
+  auto* begin = static_cast<std::byte*>(address);
+  if (mapped > bytes) {
+    const std::size_t before = -reinterpret_cast<std::uintptr_t>(begin) % kLargest;
+    if (before > 0) munmap(begin, before);
+    munmap(begin + before + bytes, mapped - before - bytes);
+    begin += before;
+    static_cast<void>(madvise(begin, bytes, MADV_HUGEPAGE));
+  }
+  // Where the kernel knows no such advice, each page is made at its first use.
+  static_cast<void>(madvise(begin, bytes, MADV_POPULATE_WRITE));
+  return begin;
+}
+
+}  // namespace
+
+SampleMemory::~SampleMemory() {
+  for (const Slab& slab : slabs_)
+    munmap(slab.begin, slab.bytes);
+}
+
+std::byte* SampleMemory::take(std::size_t bytes) {
+  bytes = (bytes + kAlignment - 1) / kAlignment * kAlignment;
+  if (bytes > left_) {
+    if (next_ == slabs_.size()) addSlab();
+    free_ = slabs_[next_].begin;
+    left_ = slabs_[next_].bytes;
+    ++next_;
+  }
+  std::byte* const taken = free_;
+  free_ += bytes;
+  left_ -= bytes;
+  return taken;
+}
+
+void SampleMemory::addSlab() {
+  const std::size_t bytes =
+      slabs_.empty() ? kSmallest : std::min(2 * slabs_.back().bytes, kLargest);
+  slabs_.reserve(slabs_.size() + 1);
+  slabs_.push_back({map(bytes), bytes});
+}
+
+void SampleMemory::reuse() {
+  next_ = 0;
+  left_ = 0;
+}
+
+}  // namespace tavrel

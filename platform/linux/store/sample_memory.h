@@ -1,0 +1,37 @@
+// Memory for many small pieces that are all given up at once.
+//
+// The first touch of a page costs more than what is stored in it. Slabs, which double up to a huge
+// page, are therefore touched by the kernel in one call each.
+#pragma once
+
+#include <cstddef>
+#include <vector>
+
+namespace tavrel {
+
+class SampleMemory {
+ public:
+  SampleMemory() = default;
+  ~SampleMemory();
+  SampleMemory(const SampleMemory&) = delete;
+  SampleMemory& operator=(const SampleMemory&) = delete;
+
+  /// Aligned for numbers; `bytes` are at most 32 KiB. Valid until `reuse`. Throws `std::bad_alloc`.
+  std::byte* take(std::size_t bytes);
+  /// Gives up all pieces and keeps the slabs for the next ones.
+  void reuse();
+
+ private:
+  struct Slab {
+    std::byte* begin;
+    std::size_t bytes;
+  };
+  void addSlab();
+
+  std::vector<Slab> slabs_;
+  std::size_t next_ = 0;  // slab to use after the current one
+  std::byte* free_ = nullptr;
+  std::size_t left_ = 0;
+};
+
+}  // namespace tavrel
