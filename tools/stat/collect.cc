@@ -14,6 +14,7 @@
 #include "base/arithmetic.h"
 #include "base/format.h"
 #include "tools/shared/table.h"
+#include "tools/stat/collect_sources.h"
 #include "tools/stat/collect_state.h"
 #include "tools/stat/machine_statistics.h"
 #include "tools/stat/stat_progress.h"
@@ -33,7 +34,7 @@ constexpr std::uint64_t kReadingsPerCount = 60;
 class Collector {
  public:
   Collector(ToolContext& context, ValueRecorder& recorder)
-      : context_(context), recorder_(recorder) {}
+      : sources_(context.root()), recorder_(recorder) {}
 
   void startFrom(CollectState state) { last_ = std::move(state); }
 
@@ -41,8 +42,7 @@ class Collector {
     const ValueTime time = valueTimeNow();
     const auto processes =
         count_ % kReadingsPerCount == 0 ? Processes::Counted : Processes::LeftOut;
-    CollectState now{
-        .at = at, .machine = readMachine(context_.root(), processes), .remainders = {}};
+    CollectState now{.at = at, .machine = sources_.read(processes), .remainders = {}};
     const MachineReading* const before = last_ ? &last_->machine : nullptr;
     const double secondsBetween = last_ ? std::chrono::duration<double>(at - last_->at).count() : 0;
     if (last_) now.remainders = std::move(last_->remainders);
@@ -111,7 +111,7 @@ class Collector {
     return Done{};
   }
 
-  ToolContext& context_;
+  MachineSources sources_;
   ValueRecorder& recorder_;
   std::optional<CollectState> last_;
   std::vector<TimedValue> values_;

@@ -1,5 +1,7 @@
 #include "tools/stat/collect_sources.h"
 
+#include <algorithm>
+#include <array>
 #include <charconv>
 #include <dirent.h>
 #include <fcntl.h>
@@ -8,9 +10,7 @@
 #include <string>
 #include <sys/statvfs.h>
 #include <unistd.h>
-#include <vector>
-
-#include "platform/linux/files/descriptor.h"
+#include <utility>
 
 namespace tavrel {
 namespace {
@@ -18,21 +18,23 @@ namespace {
 // Bytes of a file in /proc or /sys. Those of machines with hundreds of CPUs have some 100 KiB.
 constexpr std::size_t kLargestFile = 1U << 20;
 
-// Empty when it cannot be read.
+// Replaces `content`; empty when the file cannot be read.
+void readAgain(const Descriptor& file, std::string& content) {
+  constexpr std::size_t kPart = 4096;
+  std::size_t size = 0;
+  for (ssize_t got = 1; got > 0; size += static_cast<std::size_t>(got)) {
+    if (content.size() < size + kPart) content.resize(size + kPart);
+    got = pread(file.get(), content.data() + size, kPart, static_cast<off_t>(size));
+    if (got < 0 || size > kLargestFile) return content.clear();
+  }
+  content.resize(size);
+}
+
 std::string contentOf(const std::string& path) {
   const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
   std::string content;
-  if (!file) return content;
-  char part[4096];
-  for (ssize_t size = 0; (size = read(file.get(), part, sizeof part)) > 0;) {
-    content.append(part, static_cast<std::size_t>(size));
-    if (content.size() > kLargestFile) return {};
-  }
+  if (file) readAgain(file, content);
   return content;
-}
-
-std::string contentOf(const DeviceRoot& root, std::string_view devicePath) {
-  return contentOf(root.pathOrMachine(devicePath));
 }
 
 // Hands the names in a folder to `take`.
@@ -55,17 +57,28 @@ std::string_view takeLine(std::string_view& text) {
   return line;
 }
 
-std::vector<std::string_view> fieldsOf(std::string_view line) {
-  std::vector<std::string_view> fields;
-  constexpr std::string_view kBlanks = " \t";
-  for (auto start = line.find_first_not_of(kBlanks); start != std::string_view::npos;
-       start = line.find_first_not_of(kBlanks, start)) {
-    const auto end = std::min(line.find_first_of(kBlanks, start), line.size());
-    fields.push_back(line.substr(start, end - start));
-    start = end;
+// The first fields of a line, as many as are used.
+class Fields {
+ public:
+  explicit Fields(std::string_view line) {
+    const auto isBlank = [](char c) { return c == ' ' || c == '\t'; };
+    const char* at = line.data();
+    const char* const end = at + line.size();
+    while (count_ < fields_.size()) {
+      at = std::find_if_not(at, end, isBlank);
+      if (at == end) break;
+      const char* const start = std::exchange(at, std::find_if(at, end, isBlank));
+      fields_[count_++] = {start, at};
+    }
   }
-  return fields;
-}
+  std::size_t size() const { return count_; }
+  bool empty() const { return count_ == 0; }
+  std::string_view operator[](std::size_t number) const { return fields_[number]; }
+
+ private:
+  std::array<std::string_view, 10> fields_;
+  std::size_t count_ = 0;
+};
 
 template <class Number>
 std::optional<Number> numberOf(std::string_view text) {
@@ -76,101 +89,9 @@ std::optional<Number> numberOf(std::string_view text) {
 }
 
 template <class Number>
-std::optional<Number> firstNumber(const std::string& text) {
-  const auto fields = fieldsOf(text);
+std::optional<Number> firstNumber(std::string_view text) {
+  const Fields fields(text);
   return fields.empty() ? std::nullopt : numberOf<Number>(fields[0]);
-}
-
-// "cpu  user nice system idle iowait irq softirq steal ...", then a line for each CPU. Guest time
-// is part of user time.
-void readCpu(const DeviceRoot& root, MachineReading& reading) {
-  constexpr std::size_t kIdle = 4;
-  constexpr std::size_t kWaiting = 5;
-  constexpr std::size_t kStolen = 8;
-  const std::string content = contentOf(root, "/proc/stat");
-  std::string_view rest = content;
-  const auto all = fieldsOf(takeLine(rest));
-  if (all.size() <= kWaiting || all[0] != "cpu") return;
-  MachineReading::CpuTicks ticks{0, 0};
-  for (std::size_t i = 1; i < all.size() && i <= kStolen; ++i) {
-    const auto part = numberOf<std::uint64_t>(all[i]);
-    if (!part) return;
-    ticks.total += *part;
-    if (i != kIdle && i != kWaiting) ticks.busy += *part;
-  }
-  reading.cpu = ticks;
-  while (takeLine(rest).starts_with("cpu"))
-    ++reading.cpus;
-}
-
-void readMemory(const DeviceRoot& root, MachineReading& reading) {
-  const std::string content = contentOf(root, "/proc/meminfo");
-  std::string_view rest = content;
-  std::optional<std::uint64_t> swapTotal;
-  std::optional<std::uint64_t> swapFree;
-  while (!rest.empty()) {
-    const auto fields = fieldsOf(takeLine(rest));
-    if (fields.size() < 2) continue;
-    const auto kib = numberOf<std::uint64_t>(fields[1]);
-    if (fields[0] == "MemTotal:") reading.memoryTotalKib = kib;
-    if (fields[0] == "MemAvailable:") reading.memoryAvailableKib = kib;
-    if (fields[0] == "SwapTotal:") swapTotal = kib;
-    if (fields[0] == "SwapFree:") swapFree = kib;
-  }
-  if (swapTotal && swapFree && *swapFree <= *swapTotal)
-    reading.swapUsedKib = *swapTotal - *swapFree;
-}
-
-// "  eth0: bytes packets errs drop fifo frame compressed multicast bytes ...", after two lines of
-// titles.
-std::optional<MachineReading::Traffic> readNetwork(const DeviceRoot& root) {
-  constexpr std::size_t kReceived = 0;
-  constexpr std::size_t kSent = 8;
-  const std::string content = contentOf(root, "/proc/net/dev");
-  std::string_view rest = content;
-  takeLine(rest);
-  takeLine(rest);
-  std::optional<MachineReading::Traffic> traffic;
-  while (!rest.empty()) {
-    const std::string_view line = takeLine(rest);
-    const auto colon = line.find(':');
-    if (colon == std::string_view::npos) continue;
-    const auto name = fieldsOf(line.substr(0, colon));
-    const auto fields = fieldsOf(line.substr(colon + 1));
-    if (name.size() != 1 || name[0] == "lo" || fields.size() <= kSent) continue;
-    const auto in = numberOf<std::uint64_t>(fields[kReceived]);
-    const auto out = numberOf<std::uint64_t>(fields[kSent]);
-    if (!in || !out) continue;
-    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
-    traffic->in += *in;
-    traffic->out += *out;
-  }
-  return traffic;
-}
-
-// "major minor name reads merged sectors ms writes merged sectors ...", sectors of 512 bytes.
-std::optional<MachineReading::Traffic> readDisks(const DeviceRoot& root) {
-  constexpr std::size_t kName = 2;
-  constexpr std::size_t kRead = 5;
-  constexpr std::size_t kWritten = 9;
-  constexpr std::uint64_t kSector = 512;
-  const std::string content = contentOf(root, "/proc/diskstats");
-  std::string_view rest = content;
-  std::optional<MachineReading::Traffic> traffic;
-  while (!rest.empty()) {
-    const auto fields = fieldsOf(takeLine(rest));
-    if (fields.size() <= kWritten) continue;
-    if (isVirtualDisk(fields[kName])) continue;
-    const std::string device = "/sys/block/" + std::string(fields[kName]) + "/device";
-    if (access(root.pathOrMachine(device).c_str(), F_OK) != 0) continue;
-    const auto in = numberOf<std::uint64_t>(fields[kRead]);
-    const auto out = numberOf<std::uint64_t>(fields[kWritten]);
-    if (!in || !out) continue;
-    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
-    traffic->in += *in * kSector;
-    traffic->out += *out * kSector;
-  }
-  return traffic;
 }
 
 // Thermal zones give thousandths of a degree.
@@ -212,17 +133,124 @@ void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
 
 }  // namespace
 
-MachineReading readMachine(const DeviceRoot& root, Processes processes) {
+std::string_view MachineSources::contentOf(std::string_view devicePath) {
+  auto found = files_.find(devicePath);
+  if (found == files_.end()) {
+    const std::string path = root_.pathOrMachine(devicePath);
+    Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    if (!file) return {};
+    found = files_.emplace(devicePath, std::move(file)).first;
+  }
+  readAgain(found->second, content_);
+  return content_;
+}
+
+bool MachineSources::isDisk(std::string_view name) {
+  const auto found = disks_.find(name);
+  if (found != disks_.end()) return found->second;
+  const std::string device = "/sys/block/" + std::string(name) + "/device";
+  const bool is = !isVirtualDisk(name) && access(root_.pathOrMachine(device).c_str(), F_OK) == 0;
+  disks_.emplace(name, is);
+  return is;
+}
+
+// "cpu  user nice system idle iowait irq softirq steal ...", then a line for each CPU. Guest time
+// is part of user time.
+void MachineSources::readCpu(MachineReading& reading) {
+  constexpr std::size_t kIdle = 4;
+  constexpr std::size_t kWaiting = 5;
+  constexpr std::size_t kStolen = 8;
+  std::string_view rest = contentOf("/proc/stat");
+  const Fields all(takeLine(rest));
+  if (all.size() <= kWaiting || all[0] != "cpu") return;
+  MachineReading::CpuTicks ticks{0, 0};
+  for (std::size_t i = 1; i < all.size() && i <= kStolen; ++i) {
+    const auto part = numberOf<std::uint64_t>(all[i]);
+    if (!part) return;
+    ticks.total += *part;
+    if (i != kIdle && i != kWaiting) ticks.busy += *part;
+  }
+  reading.cpu = ticks;
+  while (takeLine(rest).starts_with("cpu"))
+    ++reading.cpus;
+}
+
+void MachineSources::readMemory(MachineReading& reading) {
+  std::string_view rest = contentOf("/proc/meminfo");
+  std::optional<std::uint64_t> swapTotal;
+  std::optional<std::uint64_t> swapFree;
+  while (!rest.empty()) {
+    const Fields fields(takeLine(rest));
+    if (fields.size() < 2) continue;
+    const auto kib = numberOf<std::uint64_t>(fields[1]);
+    if (fields[0] == "MemTotal:") reading.memoryTotalKib = kib;
+    if (fields[0] == "MemAvailable:") reading.memoryAvailableKib = kib;
+    if (fields[0] == "SwapTotal:") swapTotal = kib;
+    if (fields[0] == "SwapFree:") swapFree = kib;
+  }
+  if (swapTotal && swapFree && *swapFree <= *swapTotal)
+    reading.swapUsedKib = *swapTotal - *swapFree;
+}
+
+// "  eth0: bytes packets errs drop fifo frame compressed multicast bytes ...", after two lines of
+// titles.
+std::optional<MachineReading::Traffic> MachineSources::readNetwork() {
+  constexpr std::size_t kReceived = 0;
+  constexpr std::size_t kSent = 8;
+  std::string_view rest = contentOf("/proc/net/dev");
+  takeLine(rest);
+  takeLine(rest);
+  std::optional<MachineReading::Traffic> traffic;
+  while (!rest.empty()) {
+    const std::string_view line = takeLine(rest);
+    const auto colon = line.find(':');
+    if (colon == std::string_view::npos) continue;
+    const Fields name(line.substr(0, colon));
+    const Fields fields(line.substr(colon + 1));
+    if (name.size() != 1 || name[0] == "lo" || fields.size() <= kSent) continue;
+    const auto in = numberOf<std::uint64_t>(fields[kReceived]);
+    const auto out = numberOf<std::uint64_t>(fields[kSent]);
+    if (!in || !out) continue;
+    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
+    traffic->in += *in;
+    traffic->out += *out;
+  }
+  return traffic;
+}
+
+// "major minor name reads merged sectors ms writes merged sectors ...", sectors of 512 bytes.
+std::optional<MachineReading::Traffic> MachineSources::readDisks() {
+  constexpr std::size_t kName = 2;
+  constexpr std::size_t kRead = 5;
+  constexpr std::size_t kWritten = 9;
+  constexpr std::uint64_t kSector = 512;
+  std::string_view rest = contentOf("/proc/diskstats");
+  std::optional<MachineReading::Traffic> traffic;
+  while (!rest.empty()) {
+    const Fields fields(takeLine(rest));
+    if (fields.size() <= kWritten) continue;
+    if (!isDisk(fields[kName])) continue;
+    const auto in = numberOf<std::uint64_t>(fields[kRead]);
+    const auto out = numberOf<std::uint64_t>(fields[kWritten]);
+    if (!in || !out) continue;
+    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
+    traffic->in += *in * kSector;
+    traffic->out += *out * kSector;
+  }
+  return traffic;
+}
+
+MachineReading MachineSources::read(Processes processes) {
   MachineReading reading;
-  reading.uptimeSeconds = firstNumber<double>(contentOf(root, "/proc/uptime"));
-  reading.loadOfOneMinute = firstNumber<double>(contentOf(root, "/proc/loadavg"));
-  if (processes == Processes::Counted) reading.processes = countProcesses(root);
-  readCpu(root, reading);
-  readMemory(root, reading);
-  reading.network = readNetwork(root);
-  reading.disk = readDisks(root);
-  reading.celsius = readTemperature(root);
-  readDataFolder(root, reading);
+  reading.uptimeSeconds = firstNumber<double>(contentOf("/proc/uptime"));
+  reading.loadOfOneMinute = firstNumber<double>(contentOf("/proc/loadavg"));
+  if (processes == Processes::Counted) reading.processes = countProcesses(root_);
+  readCpu(reading);
+  readMemory(reading);
+  reading.network = readNetwork();
+  reading.disk = readDisks();
+  reading.celsius = readTemperature(root_);
+  readDataFolder(root_, reading);
   return reading;
 }
 
