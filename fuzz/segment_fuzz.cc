@@ -28,7 +28,7 @@ struct Checked : SegmentSink {
   }
   void takeScalar(const SegmentScalar& scalar) override { check(scalar.key, true); }
   void takeRecord(const SegmentRecord& record) override {
-    check(record.key, record.secondsInDay < kBHSecondsPerDay);
+    check(*record.key, record.secondsInDay < kBHSecondsPerDay);
   }
   std::size_t values = 0;
 };

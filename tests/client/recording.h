@@ -102,7 +102,7 @@ class Recording : public testing::Test, public SegmentSink {
     if (scalar.isSet) setTimes.push_back(scalar.setTime);
   }
   void takeRecord(const SegmentRecord& record) override {
-    records[std::string(record.key)].push_back(record.value);
+    records[*record.key].push_back(record.value);
     seconds.push_back(record.day * std::int64_t{86'400} + record.secondsInDay);
   }
 

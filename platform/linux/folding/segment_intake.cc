@@ -51,9 +51,9 @@ void SegmentIntake::takeScalar(const SegmentScalar& scalar) {
 
 SegmentIntake::Series* SegmentIntake::findSeries(const SegmentRecord& record) {
   const auto [found, isNew] = series_.try_emplace({record.keyNumber, record.day}, nullptr);
-  if (isNew && mayTake(record.key, record.day) &&
-      rows_.find(user_, record.day, record.key, false) != nullptr) {
-    found->second = &distributions_.series(record.day, record.key);
+  if (isNew && mayTake(*record.key, record.day) &&
+      rows_.find(user_, record.day, *record.key, false) != nullptr) {
+    found->second = &distributions_.series(record.day, *record.key);
   }
   return found->second;
 }

@@ -20,7 +20,7 @@ class SelectingSink final : public SegmentSink {
     if (selection_.contains(scalar.day, scalar.key)) intake_.takeScalar(scalar);
   }
   void takeRecord(const SegmentRecord& record) override {
-    if (selection_.contains(record.day, record.key)) intake_.takeRecord(record);
+    if (selection_.contains(record.day, *record.key)) intake_.takeRecord(record);
   }
 
  private:

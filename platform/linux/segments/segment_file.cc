@@ -12,6 +12,10 @@
 namespace tavrel {
 namespace {
 
+// In place of kinds that keys have: not looked for yet, and none that can be used.
+constexpr std::uint8_t kUnread = 0xff;
+constexpr std::uint8_t kNoKind = 0;
+
 // Names reach logs and tables.
 bool isValidName(std::string_view name) {
   return std::none_of(name.begin(), name.end(),
@@ -67,8 +71,9 @@ void SegmentFile::readKeys(std::uint32_t number) {
   std::uint64_t namesStart = 0;
   std::uint64_t namesEnd = 0;
   for (std::uint32_t i = 0; i < kAtOnce; ++i) {
-    Key& key = keys_[first + i + 1];
-    if (key.isRead) continue;
+    std::uint8_t& keptKind = kinds_[first + i + 1];
+    std::string& name = names_[first + i + 1];
+    if (keptKind != kUnread) continue;
     const std::uint64_t entry =
         *loadNative64(entries, std::size_t{i} * std::size_t{kBHKeyEntryBytes});
     const std::uint64_t offset = entry & 0xffffffff;
@@ -83,19 +88,21 @@ void SegmentFile::readKeys(std::uint32_t number) {
       namesStart = offset;
       namesEnd = offset + size;
     }
-    key.name = asText(ByteSpan(names).subspan(offset - namesStart, length));
-    if (isValidName(key.name)) key.kind = static_cast<std::uint8_t>(entry >> 48);
-    key.isRead = true;
+    name = asText(ByteSpan(names).subspan(offset - namesStart, length));
+    const auto kind = static_cast<std::uint8_t>(entry >> 48);
+    keptKind = isValidName(name) && kind != kUnread ? kind : kNoKind;
   }
-  keys_[number].isRead = true;
+  if (kinds_[number] == kUnread) kinds_[number] = kNoKind;
 }
 
-const std::string* SegmentFile::key(std::uint32_t number, std::uint8_t kind) {
+const std::string* SegmentFile::readKey(std::uint32_t number, std::uint8_t kind) {
   if (number == 0 || number > kBHKeys) return nullptr;
-  if (keys_.empty()) keys_.resize(kBHKeys + 1);
-  const Key& key = keys_[number];
-  if (!key.isRead) readKeys(number);
-  return key.kind == kind ? &key.name : nullptr;
+  if (kinds_.empty()) {
+    kinds_.assign(kBHKeys + 1, kUnread);
+    names_.resize(kBHKeys + 1);
+  }
+  if (kinds_[number] == kUnread) readKeys(number);
+  return kinds_[number] == kind ? &names_[number] : nullptr;
 }
 
 }  // namespace tavrel

@@ -34,19 +34,19 @@ class SegmentFile {
 
   /// The name of the key with this number; null when there is no valid one of this kind. It stays
   /// in place as long as this object lives.
-  const std::string* key(std::uint32_t number, std::uint8_t kind);
+  const std::string* key(std::uint32_t number, std::uint8_t kind) {
+    if (number < kinds_.size() && kinds_[number] == kind) return &names_[number];
+    return readKey(number, kind);
+  }
 
  private:
-  struct Key {
-    bool isRead = false;
-    std::uint8_t kind = 0;
-    std::string name;
-  };
-
+  const std::string* readKey(std::uint32_t number, std::uint8_t kind);
   void readKeys(std::uint32_t number);
 
   int descriptor_;
-  std::vector<Key> keys_;  // by number, once one was asked for
+  // By number, once one was asked for. Kinds are apart from the names, to stay near the processor.
+  std::vector<std::uint8_t> kinds_;
+  std::vector<std::string> names_;
 };
 
 }  // namespace tavrel

@@ -333,7 +333,7 @@ void SegmentReader::takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t in
     const std::uint64_t bits =
         *loadNative64(bytes, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes);
     reading.sink.takeRecord(
-        {*key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
+        {key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
   }
   reading.position.chunks[index] = {look.generation, look.ready};
   if (look.ready == kBHChunkRecords && !reading.writerIsGone &&

@@ -15,6 +15,7 @@
 
 #include <cstdint>
 #include <optional>
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -36,7 +37,7 @@ struct SegmentScalar {
 
 /// A measurement.
 struct SegmentRecord {
-  std::string_view key;     // valid as long as the reader
+  const std::string* key;   // valid as long as the reader
   std::uint32_t keyNumber;  // of the key in this segment, from 1 to kBHKeys
   std::int32_t day;
   std::uint32_t secondsInDay;

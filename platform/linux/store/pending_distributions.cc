@@ -12,9 +12,10 @@ namespace {
 constexpr std::size_t kSeriesBytes = 256;
 
 // Values of a distribution's first piece, and at most of a later one. Each has room for twice as
-// many as the one before, so that few values take little memory.
+// many as the one before, so that few values take little memory. Pieces are small, so that those of
+// many distributions that grow at the same time share pages.
 constexpr std::uint32_t kFewest = 8;
-constexpr std::uint32_t kMost = 512;
+constexpr std::uint32_t kMost = 64;
 
 constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
 

@@ -31,12 +31,12 @@ class PendingDistributions {
   /// The values of one distribution.
   class Series {
     friend class PendingDistributions;
-    std::unique_ptr<const std::string> key_;
-    std::vector<Piece> pieces_;
     // Where the next one goes in the last piece, and how many more it takes.
     std::byte* value_ = nullptr;
     std::byte* offset_ = nullptr;
     std::uint32_t room_ = 0;
+    std::vector<Piece> pieces_;
+    std::unique_ptr<const std::string> key_;
   };
 
   /// Stays in place until `clear`.

@@ -1,7 +1,6 @@
 #include "platform/linux/store/sample_memory.h"
 
 #include <algorithm>
-#include <cstdint>
 #include <new>
 #include <sys/mman.h>
 
@@ -9,26 +8,16 @@ namespace tavrel {
 namespace {
 
 constexpr std::size_t kSmallest = 64U << 10;
-constexpr std::size_t kLargest = 2U << 20;
+constexpr std::size_t kLargest = 1U << 20;
 constexpr std::size_t kAlignment = 16;
 
-// Of a huge page, an address where one can begin.
 std::byte* map(std::size_t bytes) {
-  const std::size_t mapped = bytes == kLargest ? 2 * bytes : bytes;
-  void* const address =
-      mmap(nullptr, mapped, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
-  if (address == MAP_FAILED) throw std::bad_alloc();
-  auto* begin = static_cast<std::byte*>(address);
-  if (mapped > bytes) {
-    const std::size_t before = -reinterpret_cast<std::uintptr_t>(begin) % kLargest;
-    if (before > 0) munmap(begin, before);
-    munmap(begin + before + bytes, mapped - before - bytes);
-    begin += before;
-    static_cast<void>(madvise(begin, bytes, MADV_HUGEPAGE));
-  }
+  void* const begin =
+      mmap(nullptr, bytes, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  if (begin == MAP_FAILED) throw std::bad_alloc();
   // Where the kernel knows no such advice, each page is made at its first use.
   static_cast<void>(madvise(begin, bytes, MADV_POPULATE_WRITE));
-  return begin;
+  return static_cast<std::byte*>(begin);
 }
 
 }  // namespace
@@ -55,6 +44,7 @@ std::byte* SampleMemory::take(std::size_t bytes) {
 void SampleMemory::addSlab() {
   const std::size_t bytes =
       slabs_.empty() ? kSmallest : std::min(2 * slabs_.back().bytes, kLargest);
+  // Nothing can fail between the mapping and its entry.
   slabs_.reserve(slabs_.size() + 1);
   slabs_.push_back({map(bytes), bytes});
 }

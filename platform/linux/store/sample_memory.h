@@ -1,7 +1,7 @@
 // Memory for many small pieces that are all given up at once.
 //
-// The first touch of a page costs more than what is stored in it. Slabs, which double up to a huge
-// page, are therefore touched by the kernel in one call each.
+// The first touch of a page costs more than what is stored in it. The kernel therefore makes the
+// pages of a slab in one call.
 #pragma once
 
 #include <cstddef>
