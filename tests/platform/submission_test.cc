@@ -48,7 +48,9 @@ struct Service : ProcessServices {
     return {fileSystem, coding, preferences, preferences, days, version, clock, log};
   }
   void readRowsOf(std::int32_t day) {
-    days.initWithDefaultPath()->scalarsForKeyPrefix("", day - 1, day, {});
+    const auto history = days.initWithDefaultPath();
+    if (day % 2 == 0) return history->scalarsForKeyPrefix("", day - 1, day, {});
+    history->distributionsForKeyPrefix("", day - 1, day, {});
   }
   bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
     readRowsOf(kToday - 1);
@@ -186,7 +188,9 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
     permit(device, given.isGiven, given.firstDay);
     Service service(device.root);
     EXPECT_EQ(service.submission.isDiagnosticSubmissionEnabled(), given.mayReportYesterday);
-    if (given.day != kNoRows) service.readRowsOf(given.day);
+    // The earliest day that was read decides.
+    for (const int later : {0, 1})
+      if (given.day != kNoRows) service.readRowsOf(given.day + later);
     const std::string folder = device.root.path(kFolder + given.place);
     if (!service.writeLog("X")) {
       EXPECT_NE(service.log.lines.back().find(given.place), std::string::npos)
@@ -194,6 +198,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
     } else {
       EXPECT_EQ(std::distance(fs::directory_iterator(folder), {}), 2);
     }
+    EXPECT_FALSE(service.days.takeEarliest());
   }
 }
 
