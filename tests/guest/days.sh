@@ -9,7 +9,7 @@ systemd-run --quiet --unit=recorder --uid=recorder python3 "$here/recorder.py"
 record() {
   echo "$1" >/run/recorder/in
   read -r answer </run/recorder/out
-  [ "$answer" = recorded ]
+  [ "$answer" = recorded ] || expect "a value is recorded" recorded "$answer"
 }
 
 tavrelctl allow >/dev/null

@@ -15,6 +15,9 @@ for timer in daily fold upload; do
   printf '[Timer]\nRandomizedDelaySec=0\nAccuracySec=1s\n' \
     >"/run/systemd/system/tavrel-$timer.timer.d/exact.conf"
 done
+# And no run that is due by the time since the start.
+printf 'OnBootSec=\nOnCalendar=*-*-* 00:05:00 UTC\n' \
+  >>/run/systemd/system/tavrel-daily.timer.d/exact.conf
 systemctl daemon-reload
 systemd-run --quiet --unit=keeps-slice --slice=tavrel.slice sleep infinity
 find / -xdev | sort >/root/before
