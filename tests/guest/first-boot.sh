@@ -18,18 +18,5 @@ for part in check install server $parts; do
   . "$here/$part.sh"
 done
 checked || exit 1
-
-# The daily run of the next day. The plug is pulled when its log is there and it is still at work:
-# frozen, so that it does not come to its end meanwhile. The watcher yields to the run.
-cat >/run/watch <<'WATCH'
-found=
-until [ -e "$found" ]; do
-  for found in "$1"/pending/log-tallied-20371125*.log; do :; done
-done
-echo 1 >/sys/fs/cgroup/tavrel.slice/cgroup.freeze
-WATCH
-nice -n 10 sh /run/watch "$submission" &
-date --utc --set '2037-11-25 01:10' >/dev/null
-wait
-touch /run/job/pull
-sleep 60
+# shellcheck source=/dev/null
+. "$here/power-cut.sh"

@@ -2,8 +2,11 @@
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 socket=/run/tavrel/com.norvane.tallied.tavrel.socket
 expect "the service sleeps" inactive "$(systemctl is-active tavrel.service)"
-tavrelctl send force yesterday
+tavrelctl send force yesterday >/dev/null 2>&1
 expect "a client starts it" active "$(systemctl is-active tavrel.service)"
+until [ -n "$(logs pending)" ]; do sleep 0.2; done
+expect "it files the log of the day" log-tallied "$(logs pending)"
+rm "$submission"/pending/*
 expect "other users are refused" 1 "$(setpriv --reuid recorder --clear-groups \
   tavrelctl send force yesterday >/dev/null 2>&1; echo $?)"
 

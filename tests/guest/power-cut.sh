@@ -1,0 +1,15 @@
+# A power cut in the daily run of the next day. The plug is pulled when its log is there and it is
+# still at work: frozen, so that it does not come to its end meanwhile. The watcher yields to the run.
+# shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
+cat >/run/watch <<'WATCH'
+found=
+until [ -e "$found" ]; do
+  for found in "$1"/pending/log-tallied-20371125*.log; do :; done
+done
+echo 1 >/sys/fs/cgroup/tavrel.slice/cgroup.freeze
+WATCH
+nice -n 10 sh /run/watch "$submission" &
+date --utc --set '2037-11-25 01:10' >/dev/null
+wait
+touch /run/job/pull
+sleep 60
