@@ -3,7 +3,9 @@
 day_done() {
   tavrelctl prefs get com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970
 }
-expect "the day is not done" 24798 "$(day_done)"
+expect "the log of the run that was cut off is whole" "24799 (2037-11-24)" \
+  "$(tavrelctl log show latest | sed -n 's/^Day *//p')"
+most "the day is not done" 24798 "$(day_done)"
 tavrelctl status --check >/root/status
 expect "status --check sees the unfinished run" 1 "$?"
 expect "what it says of it" "WARNING last-run: the daily run of day 24799 (2037-11-24), begun AGO, \
@@ -18,5 +20,7 @@ expect "a run is due again without a midnight" 10min \
 systemctl start tavrel-daily.service
 settle
 expect "that run ends the day" 24799 "$(day_done)"
-expect "the day has one log" log-tallied "$(logs pending)$(logs outbox)"
+# A day that is not done is done again as a whole.
+expect "the day has a second log" "log-tallied
+log-tallied" "$(logs pending)"
 expect "nothing is critical after it" "" "$(tavrelctl status --check | grep -E '^(CRITICAL|UNKNOWN)')"
