@@ -35,9 +35,14 @@ uncover() {
   for folder in "$@"; do umount "$folder"; done
 }
 
+# What waits since the power cut goes with the first upload.
 nginx
 systemctl stop tavrel-fold.path tavrel-upload.path tavrel-collect.timer
 expect "units with their folders" "$all_work" "$(outcomes)"
+expect "nothing waits any more" "" "$(logs pending)$(logs outbox)"
+# It keeps files open for writing.
+nginx -s quit 2>/dev/null
+while [ -e /run/nginx.pid ]; do sleep 0.1; done
 
 for folder in $folders; do mv "$folder" "$folder.kept"; done
 expect "units without their folders" "$all_work" "$(outcomes)"
