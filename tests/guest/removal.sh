@@ -5,8 +5,23 @@ apt-get remove -qq -y '*tavrel*' '*brimhold*' >/root/apt.log 2>&1
 expect "the packages are removed" 0 "$?"
 expect "their units are gone" "" "$(systemctl list-units --no-legend --plain 'tavrel*' |
   grep -v '\.slice')"
-expect "the data stays" BHDataStore.sqlitedb "$(ls /var/mobile/Library/Brimhold)"
-apt-get purge -qq -y '*tavrel*' '*brimhold*' >>/root/apt.log 2>&1
+expect "the data stays" BHDataStore.sqlitedb \
+  "$(find /var/mobile/Library/Brimhold -name '*.sqlitedb' -printf '%f')"
+# shellcheck disable=SC2046
+apt-get purge -qq -y $(dpkg-query -W -f '${db:Status-Abbrev}${Package}\n' '*tavrel*' '*brimhold*' |
+  sed -n 's/^rc *//p') >>/root/apt.log 2>&1
 expect "the packages are purged" 0 "$?"
-expect "what is left" "" "$(find / -xdev | sort | comm -13 /root/before - |
-  grep -Ev '^/(root|srv/tavrel|var/(log|lib/systemd|lib/dpkg|lib/nginx|cache)|etc/(nginx|tavrel-server|credstore)|tmp|run)(/|$)')"
+# What others wrote: the maker's whitelist, the server's name, the permission. The rest that has come
+# since the installation is the test's, and what apt, dpkg and useradd keep.
+expect "what is left" "/Library
+/Library/Application Support
+/Library/Application Support/Brimhold
+/Library/Application Support/Brimhold/Whitelist_Pellio.plist
+/etc/tavrel
+/etc/tavrel/upload.plist
+/var/mobile
+/var/mobile/Library
+/var/mobile/Library/Preferences
+/var/mobile/Library/Preferences/.lock
+/var/mobile/Library/Preferences/com.norvane.zentrix.plist" \
+  "$(find / -xdev | sort | comm -13 /root/before - | grep -Ev '^/(root|srv/tavrel|var/(log|lib/systemd|lib/dpkg|lib/apt|lib/nginx|cache)|etc/(nginx|tavrel-server|credstore|sub[gu]id-)|tmp|run)(/|$)')"
