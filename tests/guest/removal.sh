@@ -8,7 +8,7 @@ expect "their units are gone" "" "$(systemctl list-units --no-legend --plain 'ta
 expect "the data stays" BHDataStore.sqlitedb \
   "$(find /var/mobile/Library/Brimhold -name '*.sqlitedb' -printf '%f')"
 # shellcheck disable=SC2046
-apt-get purge -qq -y $(dpkg-query -W -f '${db:Status-Abbrev}${Package}\n' '*tavrel*' '*brimhold*' |
+apt-get purge -qq -y $(dpkg-query -W -f '${db:Status-Abbrev}${Package}\n' '*tavrel*' |
   sed -n 's/^rc *//p') >>/root/apt.log 2>&1
 expect "the packages are purged" 0 "$?"
 # What others wrote: the maker's whitelist, the server's name, the permission. The rest that has come
