@@ -122,6 +122,38 @@ TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   EXPECT_EQ(rowsIn(*engine->reader()), expected);
 }
 
+TEST_P(EngineContract, TakesManyLogsAtOnce) {
+  std::vector<LogRecord> records;
+  for (std::uint64_t number = 0; number < 16'500; ++number) {
+    records.push_back(makeRecord(number));
+    records.back().scalars = {{"a", static_cast<std::int64_t>(number)}};
+  }
+  const auto engine = open();
+  EXPECT_EQ(engine->append(records).added, 16'500u);
+  EXPECT_EQ(engine->append(records).known, 16'500u);
+  std::map<LogId, std::int64_t> numbers;
+  engine->logs(0, INT32_MAX, [&](std::span<const LogRow> rows) {
+    for (const LogRow& row : rows)
+      numbers[row.log] = row.created - 1'795'000'000;
+  });
+  std::size_t right = 0;
+  engine->scalars("a", [&](std::span<const ScalarValue> rows) {
+    for (const ScalarValue& row : rows)
+      right += numbers.at(row.log) == row.value ? 1U : 0U;
+  });
+  EXPECT_EQ(right, 16'500u);
+}
+
+TEST_P(EngineContract, PassesOnWhatAVisitorThrows) {
+  const auto engine = open();
+  engine->append(fullRecords(0, 300));
+  const auto fail = [](auto) { throw std::runtime_error("enough"); };
+  EXPECT_THROW(engine->scalars("a", fail), std::runtime_error);
+  EXPECT_THROW(engine->cells("a", fail), std::runtime_error);
+  EXPECT_EQ(engine->append(fullRecords(300, 1)).added, 1u);
+  EXPECT_EQ(rowsIn(*engine).size(), 2107u);
+}
+
 TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
   const std::vector<LogRecord> records = fullRecords(0, 240);
   std::array<std::size_t, 2> added{};

@@ -27,6 +27,9 @@ const char* adviceFor(int code) {
     case SQLITE_PERM:
     case SQLITE_AUTH:
       return "check owner and permissions of the file and its folder";
+    case SQLITE_ERROR:
+    case SQLITE_CONSTRAINT:
+      return "its tables are not as this program made them; load the logs into a new file";
     case SQLITE_NOMEM:
       return "load or ask for less at once";
     default:

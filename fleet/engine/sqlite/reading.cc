@@ -123,7 +123,6 @@ std::vector<Key> Reading::keys() {
 }
 
 std::int64_t Reading::find(KeyKind kind, std::string_view key) {
-  findKey_.reset();
   findKey_.bind(1, static_cast<std::int64_t>(kind));
   findKey_.bind(2, key);
   const std::int64_t id = findKey_.step() ? findKey_.integer(0) : 0;
@@ -132,7 +131,6 @@ std::int64_t Reading::find(KeyKind kind, std::string_view key) {
 }
 
 void Reading::refreshBlocks() {
-  newBlocks_.reset();
   newBlocks_.bind(1, blocks_.empty() ? 0 : blocks_.back().id);
   while (newBlocks_.step())
     blocks_.push_back({newBlocks_.integer(0), newBlocks_.integer(1)});
@@ -199,17 +197,22 @@ void Reading::cells(std::string_view key, const Visitor<CellValue>& visit) {
   const std::int64_t id = find(KeyKind::kHistogram, key);
   if (id == 0) return;
   refreshBlocks();
-  buckets_.reset();
+  struct Bucket {
+    std::int64_t id = 0;
+    double lower = 0;
+    double upper = 0;
+  };
+  std::vector<Bucket> buckets;
   buckets_.bind(1, id);
-  while (buckets_.step()) {
-    const double lower = buckets_.real(1);
-    const double upper = buckets_.real(2);
-    visitRows(cells_, buckets_.integer(0), visit, [&](LogId log, sqlite3_value** values) {
-      return CellValue{log, lower, upper,
+  while (buckets_.step())
+    buckets.push_back({buckets_.integer(0), buckets_.real(1), buckets_.real(2)});
+  buckets_.reset();
+  for (const Bucket& bucket : buckets) {
+    visitRows(cells_, bucket.id, visit, [&](LogId log, sqlite3_value** values) {
+      return CellValue{log, bucket.lower, bucket.upper,
                        static_cast<std::uint64_t>(sqlite3_value_int64(values[1]))};
     });
   }
-  buckets_.reset();
 }
 
 }  // namespace tavrel::fleet
