@@ -70,7 +70,8 @@ std::vector<LogRecord> fullRecords(std::uint64_t first, std::uint64_t count) {
 TEST_P(EngineContract, HandsOutWhatWasAppended) {
   LogRecord record = makeRecord(1, -3);
   record.previousOsVersion = "before";
-  record.configNumber = "c";
+  const std::string longText(300, 'c');
+  record.configNumber = longText;
   record.whitelistDigest = "w";
   record.taskID = "t";
   record.language = "de";
@@ -91,7 +92,7 @@ TEST_P(EngineContract, HandsOutWhatWasAppended) {
   const auto bits = bitsOf;
   EXPECT_THAT(rowsIn(*engine),
               UnorderedElementsAreArray(
-                  {name + "-3|Pellio 4.2 (16R349)|before|c|w|t|de|de-AT|region 1",
+                  {name + "-3|Pellio 4.2 (16R349)|before|" + longText + "|w|t|de|de-AT|region 1",
                    name + "s=-9223372036854775808", name + "t=9223372036854775807",
                    name + "s:" + bits(-0.0) + "," + bits(kInfinity) + "," + bits(std::nan("")) +
                        "," + bits(-std::nan("7")) + ",18446744073709551615",
@@ -129,7 +130,8 @@ TEST_P(EngineContract, TakesManyLogsAtOnce) {
     records.back().scalars = {{"a", static_cast<std::int64_t>(number)}};
   }
   const auto engine = open();
-  EXPECT_EQ(engine->append(records).added, 16'500u);
+  engine->append(std::span(records).first(1));
+  EXPECT_EQ(engine->append(records).added, 16'499u);
   EXPECT_EQ(engine->append(records).known, 16'500u);
   std::map<LogId, std::int64_t> numbers;
   engine->logs(0, INT32_MAX, [&](std::span<const LogRow> rows) {

@@ -59,9 +59,10 @@ int numberIn(const std::string& name, std::string_view text, int lowest, int hig
   int number = 0;
   const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
   if (error != std::errc() || end != text.data() + text.size() || number < lowest ||
-      number > highest)
+      number > highest) {
     refuse("needs a number from " + std::to_string(lowest) + " to " + std::to_string(highest) +
            " as its " + name);
+  }
   return number;
 }
 

@@ -132,10 +132,11 @@ void openTables(Server& server, bool writes) {
   const std::string distributed = address.database + "_" + address.cluster;
   if (writes) makeDistributedTables(server, address.database, distributed);
   versions = versionsIn(server, distributed);
-  if (versions.empty())
+  if (versions.empty()) {
     throw EngineError(address.name + ": not all servers of cluster " + address.cluster +
                       " have the tables: load into each one once, without \"cluster\" in the "
                       "address");
+  }
   checkVersion(server, versions);
   server.use(distributed);
 }

@@ -14,7 +14,7 @@ namespace {
 constexpr std::chrono::milliseconds kFirstPause{250};
 constexpr std::chrono::milliseconds kLongestPause{30'000};
 constexpr long kConnectSeconds = 10;
-constexpr std::size_t kLongestComplaint = 64 * 1024;
+constexpr std::size_t kLongestComplaint = 65'536;
 constexpr std::size_t kLongestReason = 300;
 
 // Codes of conditions that pass: time exceeded, too many queries, network trouble between servers,
