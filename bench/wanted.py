@@ -34,6 +34,11 @@ LIMITS = {
     "fleet: filing, ratio to plain inserts": 1.0,
     "fleet: 1,000 rows read, ms": 0.1,
     "fleet: filing in ClickHouse, ratio to its client": 2.0,
+    # 5,000 logs a second on two processors.
+    "fleet load: CPU of one log, us": 400.0,
+    # Ten times the rate of plistlib, which only reads.
+    "fleet load: wall time of a log, ratio to plistlib": 0.1,
+    "fleet load: CPU of a log among ten times as many, ratio": 1.2,
     "long history: tavrel -f, ratio to one day": 2.0,
     "long history: status, ms": 100.0,
     "long history: log list, ms": 100.0,
