@@ -13,9 +13,16 @@
 namespace tavrel::fleet {
 namespace {
 
-// What the database takes in one step. More would hold up other loaders, less costs it time.
+// What the database takes in one step. More would hold up other loaders, less costs it time; it
+// does not wait for more than the least while others still read.
 constexpr std::size_t kBatchLogs = 1'000;
+constexpr std::size_t kLeastBatchLogs = 256;
 constexpr std::size_t kBatchBytes = 64U << 20;
+
+// One thread, which has the most to do, files what the others read.
+unsigned readers() {
+  return std::max(2U, std::thread::hardware_concurrency()) - 1;
+}
 
 class Loading {
  public:
@@ -24,11 +31,15 @@ class Loading {
     if (request.setAside) setAside_.emplace(*request.setAside);
   }
 
-  Status take(ReadItem item) {
+  /// `isMoreRead`: another item can be had at once.
+  Status take(ReadItem item, bool isMoreRead) {
     if (item.record) {
       batch_.push_back(*std::move(item.record));
       batchBytes_ += item.bytes;
-      if (batch_.size() == kBatchLogs || batchBytes_ >= kBatchBytes) file();
+      if (batch_.size() == kBatchLogs || batchBytes_ >= kBatchBytes ||
+          (!isMoreRead && batch_.size() >= kLeastBatchLogs)) {
+        file();
+      }
       return Done{};
     }
     if (item.source.kind == SourceItem::Kind::kOther) {
@@ -89,9 +100,10 @@ Expected<LoadCounts> load(Engine& engine, const LoadRequest& request,
         for (const std::string& path : request.paths)
           visitSources(path, lines, sink);
       },
-      permitted, std::max(1U, std::thread::hardware_concurrency()));
+      permitted, readers());
   while (auto item = reading.next()) {
-    if (const Status taken = loading.take(*std::move(item)); !taken) return taken.error();
+    if (const Status taken = loading.take(*std::move(item), reading.isMoreRead()); !taken)
+      return taken.error();
   }
   return loading.finish();
 }

@@ -120,4 +120,10 @@ std::optional<ReadItem> ReadingThreads::next() {
   return std::move(current_->read[position_++]);
 }
 
+bool ReadingThreads::isMoreRead() {
+  if (current_ && position_ < current_->read.size()) return true;
+  const std::lock_guard lock(mutex_);
+  return order_.empty() ? foundAll_ : order_.front()->isRead;
+}
+
 }  // namespace tavrel::fleet

@@ -32,6 +32,8 @@ class ReadingThreads {
 
   /// Nothing at the end.
   std::optional<ReadItem> next();
+  /// Whether `next` would not wait.
+  bool isMoreRead();
 
  private:
   struct Stopped {};
