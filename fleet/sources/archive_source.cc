@@ -1,9 +1,13 @@
 #include "fleet/sources/archive_source.h"
 
+#include <algorithm>
 #include <archive.h>
 #include <archive_entry.h>
+#include <cstdint>
+#include <filesystem>
 #include <memory>
 #include <new>
+#include <system_error>
 #include <unordered_map>
 #include <utility>
 
@@ -17,6 +21,8 @@ namespace {
 
 using Kind = SourceItem::Kind;
 
+constexpr std::uintmax_t kLargest = std::uintmax_t{1} << 50;
+
 class Archive {
  public:
   explicit Archive(const std::string& path) : archive_(archive_read_new()) {
@@ -29,6 +35,12 @@ class Archive {
     archive_read_support_filter_lz4(archive_.get());
     archive_read_support_filter_lzip(archive_.get());
     constexpr std::size_t kBlock = 256U << 10;
+    std::error_code unknown;
+    const std::uintmax_t size = std::filesystem::file_size(path, unknown);
+    if (!unknown) {
+      most_ = limits::kArchiveFreeBytes +
+              limits::kArchiveRatio * static_cast<std::int64_t>(std::min(size, kLargest));
+    }
     if (archive_read_open_filename(archive_.get(), path.c_str(), kBlock) != ARCHIVE_OK) note();
   }
 
@@ -39,9 +51,8 @@ class Archive {
     const int code = archive_read_next_header(archive_.get(), &entry);
     if (code == ARCHIVE_EOF) return nullptr;
     if (code != ARCHIVE_OK && code != ARCHIVE_WARN) return note(), nullptr;
-    const std::int64_t expanded = archive_filter_bytes(archive_.get(), 0);
-    const std::int64_t read = archive_filter_bytes(archive_.get(), -1);
-    if (expanded - limits::kArchiveFreeBytes > limits::kArchiveRatio * read) {
+    // What is skipped is expanded, too.
+    if (archive_filter_bytes(archive_.get(), 0) > most_ || archive_entry_size(entry) > most_) {
       failure_ = format("expands to more than %lld times its size", limits::kArchiveRatio);
       return nullptr;
     }
@@ -78,6 +89,7 @@ class Archive {
     void operator()(archive* opened) const { archive_read_free(opened); }
   };
   std::unique_ptr<archive, Free> archive_;
+  std::int64_t most_ = 0;  // bytes that it may expand to
   std::string failure_;
 };
 

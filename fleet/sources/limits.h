@@ -12,8 +12,8 @@ inline constexpr std::size_t kFolderDepth = 64;
 /// Bytes of the metadata of one log: a few short texts.
 inline constexpr std::size_t kMetadataBytes = 1U << 20;
 
-/// How many times its size an archive may expand to, beyond the first bytes. Logs of many devices
-/// have much in common, but not that much.
+/// How many times its size an archive may expand to, beyond the bytes that are free. Logs of many
+/// devices have much in common, but not that much.
 inline constexpr std::int64_t kArchiveRatio = 1'000;
 inline constexpr std::int64_t kArchiveFreeBytes = 64 << 20;
 

@@ -177,6 +177,12 @@ TEST_F(LoadTest, TakesArchives) {
   EXPECT_NE(cut.error.find("refused: cut.tar: cannot be read on: "), std::string::npos)
       << cut.error;
   EXPECT_EQ(cut.status, 1);
+  // A file of a gigabyte in an archive of some kilobytes.
+  const std::string bomb =
+      format("cd %s && truncate -s 1G big.log && tar -cSf bomb.tar big.log", at(""));
+  ASSERT_EQ(std::system(bomb.c_str()), 0);
+  EXPECT_EQ(run({at("bomb.tar")}).error,
+            "tavrel-fleet: refused: bomb.tar: expands to more than 1000 times its size\n");
 }
 
 TEST_F(LoadTest, SetsAsideWhatItRefuses) {
