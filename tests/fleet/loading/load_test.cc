@@ -139,10 +139,10 @@ TEST_F(LoadTest, TakesAServersUploads) {
         device, name, status, os, options);
   };
   write("old.log.gz", gzipped(line("device-7", "201", "Pellio 4.1", "")));
-  write("lines.log",
-        line("device-7", "204", "Pell%C3%ADo 4.2", "previous_os_version=4.1%26%3D&ConfigNumber=C") +
-            line("device-8", "201", "Pellio 5", "previous_os_version=<unknown>") + "{\"half\":\n" +
-            line("device-9", "413", "Pellio 6", ""));
+  write("lines.log", line("device-7", "204", "Pell%C3%ADo 4.2",
+                          "previous_os_version=4.1%26%3D&ConfigNumber=%43") +
+                         line("device-8", "201", "Pellio 5", "previous_os_version=<unknown>") +
+                         "{\"half\":\n" + line("device-9", "413", "Pellio 6", ""));
   const Outcome outcome =
       run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
   EXPECT_EQ(outcome.error, "tavrel-fleet: lines.log: 2 lines tell of no log that has arrived\n");

@@ -213,6 +213,24 @@ TEST(LogReaderTest, NamesWhatIsWrong) {
   }
 }
 
+TEST(LogReaderTest, TakesWhatValuesCanGive) {
+  const char* const numbers[][4] = {
+      {"7", "7", "7", "0"},                 // all alike
+      {"1", "250", "nan", "nan"},           // one was not a number
+      {"1", "inf", "inf", "nan"},           // one was infinite
+      {"-inf", "inf", "nan", "nan"},        // two were
+      {"-1e308", "1.7e308", "inf", "inf"},  // their difference is
+      {"1e200", "3e200", "2e200", "inf"},   // the square of it is
+      {"nan", "nan", "nan", "nan"},         // the first was not a number
+  };
+  for (const auto& [minimum, maximum, mean, deviations] : numbers) {
+    std::string log = changed(kSampleLog, ">1</real>", std::string(">") + minimum + "</real>");
+    log = changed(log, ">250<", std::string(">") + maximum + "<");
+    log = changed(log, ">67.875<", std::string(">") + mean + "<");
+    EXPECT_EQ(faultIn(changed(log, ">44257.1875<", std::string(">") + deviations + "<")), "none");
+  }
+}
+
 TEST(LogReaderTest, RefusesWhatIsNoWholeDocument) {
   EXPECT_EQ(faultIn(""), "is empty");
   EXPECT_EQ(faultIn("{\"BHScalars\": {}}"), "is not a property list");
