@@ -58,23 +58,22 @@ double opacityOf(std::size_t index, std::size_t count) {
 
 void writeHistogram(HtmlWriter& html, const Histogram& histogram) {
   constexpr int kCell = 20, kColumn = 19;
-  const Histogram::Cell* most = nullptr;
+  Histogram::Cell most;
   double total = 0;
   for (const Histogram::Cell& cell : histogram.cells) {
-    if (most == nullptr || cell.count > most->count) most = &cell;
+    if (cell.count > most.count) most = cell;
     total += cell.count;
   }
-  const double largest = most != nullptr ? most->count : 0;
   std::string name = histogram.name + ": ";
-  name += total > 0 ? format("%s values, most in %s: %s", shortNumber(total), most->label,
-                             shortNumber(largest))
+  name += total > 0 ? format("%s values, most in %s: %s", shortNumber(total), most.label,
+                             shortNumber(most.count))
                     : "no values";
   html.begin("div", {{"class", "histogram"}});
-  html.element("span", shortNumber(largest), {{"class", "top"}});
+  html.element("span", shortNumber(most.count), {{"class", "top"}});
   beginDrawing(html, name, static_cast<int>(histogram.cells.size()) * kCell, kLength);
   int left = 0;
   for (const Histogram::Cell& cell : histogram.cells) {
-    const int height = barLength(cell.count, largest);
+    const int height = barLength(cell.count, most.count);
     if (height > 0) writeRectangle(html, {left, kLength - height, kColumn, height});
     left += kCell;
   }
@@ -108,9 +107,10 @@ void writeShares(HtmlWriter& html, std::string_view name, std::span<const Share>
   constexpr int kHeight = 10;
   constexpr std::size_t kNamed = 8;
   std::string spoken(name);
-  for (std::size_t i = 0; i < std::min(kNamed, shares.size()); ++i)
+  for (std::size_t i = 0; i < std::min(kNamed, shares.size()); ++i) {
     appendFormat(spoken, "%s %s %s", i == 0 ? ":" : ",", shares[i].label,
                  percentText(shares[i].share));
+  }
   if (shares.size() > kNamed) appendFormat(spoken, " and %zu more", shares.size() - kNamed);
   html.begin("div", {{"class", "shares"}});
   beginDrawing(html, spoken, kLength, kHeight);
