@@ -47,9 +47,10 @@ std::vector<ScalarRow> scalarRows(const PageScene& scene) {
     row.coarse = entry.value;
   }
   std::vector<ScalarRow> list;
-  for (const bool isInLog : {true, false})
+  for (const bool isInLog : {true, false}) {
     for (const auto& [key, row] : rows)
       if (row.coarse.isNull() != isInLog) list.push_back(row);
+  }
   return list;
 }
 
