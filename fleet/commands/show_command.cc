@@ -83,7 +83,9 @@ void addShowCommand(Command top, FleetContext& context) {
         Json list = Json::array();
         for (const ShowAnswer& answer : shown)
           list.push_back(shownJson(answer));
-        return context.printJson({{"days", daysJson(question.days())}, {"answers", list}});
+        return context.printJson({{"devices_at_least", question.ledger().devicesAtLeast()},
+                                  {"days", daysJson(question.days())},
+                                  {"answers", std::move(list)}});
       }
       for (const ShowAnswer& answer : shown) {
         if (&answer != &shown.front()) context.out() << "\n";

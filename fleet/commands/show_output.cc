@@ -202,7 +202,6 @@ Json shownJson(const ShowAnswer& answer) {
           {"kind", kindText(answer)},
           {"unit", entry != nullptr ? entry->unit : ""},
           {"meaning", entry != nullptr ? entry->meaning : ""},
-          {"devices_at_least", answer.devicesAtLeast},
           {"sides", std::move(sides)}};
 }
 
