@@ -107,6 +107,9 @@ std::string textOf(const FleetPage& page) {
   html.element("p",
                "A log is one day of one device and does not say which device it is of. So nobody "
                "can count devices; \"at least\" so many are those that reported on the best day.");
+  html.element("p",
+               "A percentage over a column of figures is the share of logs, or of values, that are "
+               "not above the figure. Of series only the range is known in which it lies.");
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
                         " devices are not shown by themselves. They are joined as \"" +
                         std::string(kOtherTitle) +

@@ -31,23 +31,31 @@ void writeGroups(page::HtmlWriter& html, const char* title, const SummaryPart& p
   }
 }
 
+/// Units that are words stand above the table.
+std::string cellText(double value, std::string_view unit) {
+  std::string text = page::figureText(value, unit);
+  if (!unit.empty() && text.ends_with(" " + std::string(unit))) {
+    text.resize(text.size() - unit.size() - 1);
+  }
+  return text;
+}
+
 std::string intervalText(const Interval& interval, std::string_view unit) {
   if (std::isinf(interval.lower) && std::isinf(interval.upper)) return "not known";
-  if (std::isinf(interval.lower)) return "up to " + page::figureText(interval.upper, unit);
-  if (std::isinf(interval.upper)) return "above " + page::figureText(interval.lower, unit);
-  return page::figureText(interval.lower, unit) + " to " + page::figureText(interval.upper, unit);
+  if (std::isinf(interval.lower)) return "up to " + cellText(interval.upper, unit);
+  if (std::isinf(interval.upper)) return "above " + cellText(interval.lower, unit);
+  return cellText(interval.lower, unit) + " to " + cellText(interval.upper, unit);
 }
 
 std::string percentileText(const ShownSet& set, std::size_t index, std::string_view unit) {
-  if (set.scalar)
-    return page::figureText(static_cast<double>(set.scalar->percentiles[index]), unit);
+  if (set.scalar) return cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
   if (index >= set.histogram.percentiles.size()) return "";
   return intervalText(set.histogram.percentiles[index], unit);
 }
 
 std::string meanText(const ShownSet& set, std::string_view unit) {
   const double mean = set.scalar ? set.scalar->mean : set.merged.value_or(FiveNumbers{}).mean;
-  return std::isfinite(mean) ? page::figureText(mean, unit) : "";
+  return std::isfinite(mean) ? cellText(mean, unit) : "";
 }
 
 void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& name,
@@ -58,8 +66,7 @@ void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& 
       {"Version", Align::Name}, {"Devices", Align::Number}, {"Mean", Align::Number}};
   if (hasPercentiles) {
     for (const unsigned percent : kPercents) {
-      columns.push_back(
-          {percent == 50 ? "Median" : std::to_string(percent) + " % up to", Align::Number});
+      columns.push_back({percent == 50 ? "Median" : std::to_string(percent) + " %", Align::Number});
     }
   }
   page::Table table(html, name, std::move(columns));

@@ -51,7 +51,8 @@ bool subtract(std::span<const std::uint64_t> a, std::span<const std::uint64_t> b
 
 double nearestQuotient(std::span<const std::uint64_t> number, std::uint64_t divisor, int exponent,
                        bool isNegative) {
-  // Two limbs below the number give every quotient that is not 0 more than 64 bits.
+  // With two limbs below the number, every quotient that is not 0 has more than 64 bits, and a
+  // remainder, which is at least 1 / 2^64 of the number's last bit, has one of them.
   constexpr std::size_t kExtra = 2;
   std::vector<std::uint64_t> quotient(number.size() + kExtra);
   Uint128 remainder = 0;
@@ -72,7 +73,7 @@ double nearestQuotient(std::span<const std::uint64_t> number, std::uint64_t divi
   const std::ptrdiff_t shift = last - lowest;
   std::uint64_t mantissa = bitsFrom(quotient, shift);
   const bool half = (bitsFrom(quotient, shift - 1) & 1) != 0;
-  const bool more = remainder != 0 || anyBitBelow(quotient, shift - 1);
+  const bool more = anyBitBelow(quotient, shift - 1);
   if (half && (more || (mantissa & 1) != 0)) ++mantissa;
   const double result = std::ldexp(static_cast<double>(mantissa), static_cast<int>(last));
   return isNegative ? -result : result;
