@@ -160,7 +160,6 @@ class Comparer {
   /// In the order of the keys, whatever the threads did.
   CompareAnswer answer(Ledger& ledger, const CompareRequest& request) {
     CompareAnswer answer{request, ledger.devicesAtLeast(), {}, 0, 0, 0};
-    const LogTable& table = ledger.table();
     for (std::size_t i = 0; i < keys_.size(); ++i) {
       if (!results_[i]) {
         ++answer.missing;
