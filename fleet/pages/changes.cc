@@ -165,8 +165,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
                      {"Before", Align::Number},
                      {"After", Align::Number},
                      {"Standard deviations", Align::Number},
-                     {"Devices before", Align::Number},
-                     {"Devices after", Align::Number}});
+                     {"Devices", Align::Number}});
   for (const Comparison& one : comparison.comparisons) {
     if (!one.isReal()) break;
     const std::string_view unit = unitOf(one.key.name);
@@ -175,8 +174,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     table.cell(page::figureText(one.before.mean, unit));
     table.cell(page::figureText(one.after.mean, unit));
     table.cell(one.effect ? page::shortNumber(std::round(*one.effect * 100) / 100) : "constant");
-    table.cell(countText(one.before.devices));
-    table.cell(countText(one.after.devices));
+    table.cell(countText(one.before.devices) + " and " + countText(one.after.devices));
   }
   table.end();
   const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;
