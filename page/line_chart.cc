@@ -38,7 +38,7 @@ bool isTold(const Values& values, std::size_t day) {
   return day < values.size() && values[day] && std::isfinite(*values[day]);
 }
 
-// Where the days from `day` on end whose values are told without a gap.
+// Where the days from `day` on end that have values without a gap.
 std::size_t endOfRun(const Values& values, std::size_t day) {
   while (isTold(values, day))
     ++day;

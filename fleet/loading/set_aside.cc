@@ -38,7 +38,7 @@ Status SetAside::keep(const SourceItem& refused) {
   }
   constexpr std::size_t kDigits = 16;
   std::string digest;
-  // What cannot be read is told apart by where it is.
+  // Where it is tells one that cannot be read from others.
   appendHex(digest, sha256Of(asBytes(bytes.empty() ? refused.name : bytes)));
   const std::string path =
       folder_ + '/' + digest.substr(0, kDigits) + '-' + safeName(fileNameOf(refused.name));

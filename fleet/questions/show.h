@@ -48,7 +48,7 @@ struct HistogramAnswer {
   std::vector<Interval> percentiles;
 };
 
-/// What is told of one set of logs.
+/// The answer for one set of logs.
 struct ShownSet {
   std::string title;
   std::size_t logs = 0;

@@ -1,4 +1,4 @@
-// Questions put to whole fleets: what is told, and what must not be.
+// Questions put to whole fleets: what the answers hold, and what they must not.
 #include <cmath>
 #include <gmock/gmock.h>
 #include <map>

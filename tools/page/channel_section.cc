@@ -22,7 +22,7 @@ std::string_view textOr(std::optional<std::string_view> text) {
   return text.value_or(std::string_view());
 }
 
-// Nothing to show is no failure; what cannot be sampled is told by the sampler.
+// Nothing to show is no failure; the sampler names what it cannot sample.
 std::vector<plist::Dictionary> sampledStates(ToolContext& context) {
   ReportSelection states;
   states.format = "state";

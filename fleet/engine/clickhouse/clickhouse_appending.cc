@@ -13,7 +13,7 @@ namespace {
 constexpr std::size_t kLogsInPortion = 4096;
 constexpr std::size_t kRowsInPortion = 1'000'000;
 
-// A statement may have 256 KiB, unless the server is told otherwise.
+// A statement may have 256 KiB, unless its settings say otherwise.
 constexpr std::size_t kDigestsAtOnce = 1000;
 
 std::string_view bytesOf(const LogRecord& record) {
