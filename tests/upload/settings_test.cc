@@ -23,14 +23,13 @@ TEST(Upload, HasADeadlineForEverything) {
   device.configuration.stall = seconds(1);
   ScriptedServer silent([](const std::string&) { return "H"; });
   EXPECT_EQ(device.runAgainst(silent), Outcome::Waits);
-  EXPECT_TRUE(
-      device.log.says("Operation too slow. Less than 100 bytes/sec transferred the last 1 "));
+  EXPECT_TRUE(device.log.says("Operation too slow. Less than 100 bytes/sec transferred the last "));
   device.configuration.stall = seconds(60);
   for (auto* const limit : {&device.configuration.transfer, &device.configuration.run}) {
     *limit = seconds(1);
     device.log.lines.clear();
     EXPECT_EQ(device.run(true), Outcome::Waits);
-    EXPECT_TRUE(device.log.says("Operation timed out after 1"));
+    EXPECT_TRUE(device.log.says("Operation timed out after "));
     *limit = seconds(600);
   }
   device.configuration.url = "http://hangs.example/logs";
@@ -40,7 +39,7 @@ TEST(Upload, HasADeadlineForEverything) {
   EXPECT_EQ(inChild([&] {
               alarm(60);
               return device.run(true) == Outcome::Waits &&
-                             device.log.says("Resolving timed out after 1")
+                             device.log.says("Resolving timed out after ")
                          ? 0
                          : 1;
             }),
