@@ -53,7 +53,7 @@ LogRecord fullRecord(std::uint64_t number) {
   LogRecord record = makeRecord(number);
   const auto value = static_cast<std::int64_t>(number);
   record.scalars = {
-      {"a", value}, {"b", -value}, {std::string_view("über\n'\"\0\\", 11), INT64_MIN}};
+      {"a", value}, {"b", -value}, {std::string_view("über\n'\"\0\\", 10), INT64_MIN}};
   record.distributions = {{"a", {1.5, 2.5, 2, 0.25, number}}};
   record.cells = {{"a", -kInfinity, 1, "(-inf, 1]", number}, {"a", 1, kInfinity, "(1, inf)", 1}};
   record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};

@@ -62,9 +62,10 @@ Names::Names(const Connection& connection)
       applications_(connection, kNewApplications, kAddApplication) {}
 
 std::int64_t Names::Table::next(const Connection& connection) {
-  if (highest + 1 >= kMaxNames)
+  if (highest + 1 >= kMaxNames) {
     throw EngineError(connection.path() + ": has room for " + std::to_string(kMaxNames) +
                       " names and no more: load the logs into a new file");
+  }
   return ++highest;
 }
 
