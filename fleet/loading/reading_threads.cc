@@ -27,8 +27,8 @@ ReadingThreads::~ReadingThreads() {
   {
     const std::lock_guard lock(mutex_);
     stopped_ = true;
+    changed_.notify_all();
   }
-  changed_.notify_all();
   for (std::thread& thread : threads_)
     thread.join();
 }
