@@ -150,6 +150,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   // Asked first: what is read after the last writer has gone is all that there is.
   const bool isWriterGone = findSegmentWriter((*segment)->file.get(), facts) == SegmentWriter::Gone;
   const auto state = reader.state();
+  if (Status done = reader.readable(); !done) return done;
   if (!state) {
     refuse(folder_.refusal(entry.name, state.error().message));
     return Done{};
@@ -207,6 +208,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   }
   SegmentIntake intake(name.owner, recorders_, rows_, changes_, batch.waitingDistributions());
   SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
+  if (Status done = reader.readable(); !done) return done;
   if (Status done = batch.limitWaiting(); !done) return done;
   const bool isOver = isWriterGone && progress.isComplete;
   if (isOver) position = SegmentPosition::end();

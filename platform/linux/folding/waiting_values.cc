@@ -68,6 +68,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
   // A lease could be in the way of a fold.
   const bool isWriterGone = findSegmentProcess(facts) == SegmentWriter::Gone;
   const auto state = reader.state();
+  if (Status done = reader.readable(); !done) return done;
   if (!state || *state != SegmentReader::State::Begun) return Done{};
   SegmentPosition position;
   if (history != nullptr && history->hasStore()) {
@@ -83,6 +84,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
   SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffer);
   SelectingSink sink(selection, intake);
   reader.read(position, currentBootInstant(), isWriterGone, sink);
+  if (Status done = reader.readable(); !done) return done;
   Status added = Done{};
   buffer.each([&](std::int32_t day, std::string_view key, const DistributionBlock& block) {
     if (added) added = addSeries(selection, day, key, block);

@@ -29,6 +29,7 @@ void SegmentFile::read(std::uint64_t offset, MutableByteSpan into) const {
   while (!into.empty()) {
     const ssize_t got = pread(descriptor_, into.data(), into.size(), static_cast<off_t>(offset));
     if (got < 0 && errno == EINTR) continue;
+    if (got < 0) error_ = errno;
     if (got <= 0) break;
     offset += static_cast<std::uint64_t>(got);
     into = into.subspan(static_cast<std::size_t>(got));

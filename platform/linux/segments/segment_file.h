@@ -20,7 +20,8 @@ struct SegmentFacts {
   std::uint32_t pid = 0;
 };
 
-/// Bytes beyond the end, for example of a truncated file, read as zero.
+/// Bytes beyond the end, for example of a truncated file, read as zero. So do those that cannot be
+/// read; `error` tells.
 class SegmentFile {
  public:
   /// Borrows the descriptor.
@@ -31,6 +32,9 @@ class SegmentFile {
   std::uint64_t word64(std::uint64_t offset) const;
 
   SegmentFacts facts() const;
+
+  /// The number of the last failure to read, 0 when there was none.
+  int error() const { return error_; }
 
   /// The name of the key with this number; null when there is no valid one of this kind. It stays
   /// in place as long as this object lives.
@@ -44,6 +48,7 @@ class SegmentFile {
   void readKeys(std::uint32_t number);
 
   int descriptor_;
+  mutable int error_ = 0;
   // By number, once one was asked for. Kinds are apart from the names, to stay near the processor.
   std::vector<std::uint8_t> kinds_;
   std::vector<std::string> names_;

@@ -176,6 +176,11 @@ SegmentReader::ChunkLook SegmentReader::chunkIn(ByteSpan bytes,
   return look;
 }
 
+Status SegmentReader::readable() const {
+  if (file_.error() == 0) return Done{};
+  return Error{"cannot read a segment: " + std::generic_category().message(file_.error())};
+}
+
 Expected<SegmentReader::State> SegmentReader::state() const {
   struct stat status {};
   if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};

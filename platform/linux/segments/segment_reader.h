@@ -85,6 +85,9 @@ class SegmentReader {
   Expected<State> state() const;
   SegmentFacts facts() const { return file_.facts(); }
 
+  /// Fails when something that was looked at so far could not be read: it is not to be used then.
+  Status readable() const;
+
   /// Yields what came after `position`, and advances it. `writerIsGone` says what was known before
   /// the call (see `segment_writer.h`): if true, records after an unfinished one are read too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,

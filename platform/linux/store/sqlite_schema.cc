@@ -126,8 +126,8 @@ void provideIndexFile(const std::string& path) {
   if (stat(index.c_str(), &status) == 0 || stat(path.c_str(), &status) != 0) return;
   const Descriptor made(open(index.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0600));
   if (!made) return;
-  if (geteuid() == 0) static_cast<void>(fchown(made.get(), status.st_uid, status.st_gid));
-  static_cast<void>(fchmod(made.get(), status.st_mode & 0666));
+  const bool isOwners = geteuid() != 0 || fchown(made.get(), status.st_uid, status.st_gid) == 0;
+  if (isOwners) fchmod(made.get(), status.st_mode & 0666);
 }
 
 // The store for this process alone; nothing when that takes waiting, or more than opening it.
