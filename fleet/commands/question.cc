@@ -1,5 +1,6 @@
 #include "fleet/commands/question.h"
 
+#include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
 
@@ -72,6 +73,10 @@ std::string Question::readVersion(std::string_view text) const {
                                "\" is part of several versions: write the whole of one of them");
     }
     found = &version;
+  }
+  if (found == nullptr && std::ranges::all_of(table_.texts(Attribute::kOs), &std::string::empty)) {
+    throw std::runtime_error(
+        "no log says its OS version: load the logs with their metadata, see docs/fleet-loading.md");
   }
   if (found == nullptr) {
     throw std::runtime_error("version \"" + printable(text) +

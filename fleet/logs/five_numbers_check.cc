@@ -1,5 +1,6 @@
 #include "fleet/logs/five_numbers_check.h"
 
+#include <algorithm>
 #include <cmath>
 #include <cstdint>
 #include <limits>
@@ -36,8 +37,15 @@ const char* faultOf(const FiveNumbers& n) {
     if (!(n.minimum <= n.mean && n.mean <= n.maximum)) {
       return "its mean is not between minimum and maximum";
     }
-    return std::isnan(n.squaredDeviations) ? "its deviations are not a number, but its mean is"
-                                           : nullptr;
+    if (std::isnan(n.squaredDeviations)) {
+      return "its deviations are not a number, but its mean is";
+    }
+    // They are largest when each value is the minimum or the maximum. Rounding adds to that.
+    const double most = static_cast<double>(n.count) * (n.maximum - n.mean) * (n.mean - n.minimum);
+    const double size = std::max(std::abs(n.minimum), std::abs(n.maximum));
+    const double margin = 1e-6 * (most + static_cast<double>(n.count) * size * size);
+    return n.squaredDeviations > most + margin ? "its deviations are larger than its range allows"
+                                               : nullptr;
   }
   if (std::isnan(n.mean)) {
     return std::isnan(n.squaredDeviations) ? nullptr

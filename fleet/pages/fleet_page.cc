@@ -31,6 +31,7 @@ ShowAnswer askAbout(Engine& engine, Ledger& ledger, const Key& key, const DayRan
   request.kind = key.kind;
   request.by = GroupBy::kOs;
   request.days = days;
+  request.leavesSmallOut = true;
   return show(engine, ledger, request);
 }
 
@@ -111,7 +112,8 @@ std::string textOf(const FleetPage& page) {
                "A percentage over a column of figures is the share of logs, or of values, that are "
                "not above the figure. Of series only the range is known in which it lies.");
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
-                        " devices are not shown by themselves. They are joined as \"" +
+                        " devices are not shown by themselves. Statistics leave such versions out; "
+                        "in \"The fleet\" they are joined as \"" +
                         std::string(kOtherTitle) +
                         "\", and where they could be told by a subtraction, so is the next larger "
                         "group. Buckets of histograms are joined in the same way.");

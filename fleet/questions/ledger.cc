@@ -9,9 +9,27 @@ bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   if (!hasEnough(logs)) return false;
   const auto found = shown_.find(subject);
   if (found == shown_.end()) return true;
-  return std::all_of(found->second.begin(), found->second.end(), [&](const auto& other) {
+  const auto& sets = found->second;
+  const bool differsEnough = std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
     return logs == *other || hasEnough(logs.differenceWith(*other));
   });
+  return differsEnough && leavesEnough(logs, sets, logs) &&
+         std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
+           return !other->includes(logs) || leavesEnough(*other, sets, logs);
+         });
+}
+
+bool Ledger::leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& added) const {
+  LogSet parts(table_);
+  const auto take = [&](const LogSet& part) {
+    if (!(part == whole) && whole.includes(part)) parts.add(part);
+  };
+  for (const auto& part : shown)
+    take(*part);
+  take(added);
+  if (parts.empty()) return true;
+  const LogSet rest = whole.differenceWith(parts);
+  return rest.empty() || hasEnough(rest);
 }
 
 void Ledger::noteShown(const std::string& subject, const LogSet& logs) {

@@ -27,15 +27,21 @@ class Ledger {
   std::size_t devicesAtLeast() const { return devicesAtLeast_; }
   bool hasEnough(const LogSet& logs) const { return logs.devices(table_) >= devicesAtLeast_; }
 
-  /// Whether the set has enough devices and equals each shown set of the subject, or differs from
-  /// it by enough devices.
+  /// Whether the set has enough devices, equals each shown set of the subject or differs from it by
+  /// enough devices, and leaves nothing of too few devices when all its shown parts are taken away,
+  /// from it or from a shown set that includes it.
   bool allows(const std::string& subject, const LogSet& logs) const;
   void noteShown(const std::string& subject, const LogSet& logs);
 
-  using Shown = std::map<std::string, std::vector<std::shared_ptr<const LogSet>>>;
+  using Sets = std::vector<std::shared_ptr<const LogSet>>;
+  using Shown = std::map<std::string, Sets>;
   const Shown& shown() const { return shown_; }
 
  private:
+  /// Whether the whole without the parts of it that are shown or to be shown is empty or has enough
+  /// devices.
+  bool leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& added) const;
+
   const LogTable& table_;
   const std::size_t devicesAtLeast_;
   Shown shown_;

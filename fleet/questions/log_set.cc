@@ -33,6 +33,12 @@ void LogSet::add(const LogSet& other) {
     words_[i] |= other.words_[i];
 }
 
+bool LogSet::includes(const LogSet& other) const {
+  for (std::size_t i = 0; i < words_.size(); ++i)
+    if ((other.words_[i] & ~words_[i]) != 0) return false;
+  return true;
+}
+
 std::size_t LogSet::logs() const {
   std::size_t count = 0;
   for (const std::uint64_t word : words_)

@@ -30,6 +30,7 @@ class LogSet {
   }
   bool empty() const;
   void add(const LogSet& other);
+  bool includes(const LogSet& other) const;
 
   bool operator==(const LogSet&) const = default;
 

@@ -216,8 +216,13 @@ ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
 
   const auto addSide = [&](std::string title, const auto& isOnSide) {
     const LogSet logs = logsOf(table, rows, isOnSide);
-    Division division =
-        divide(ledger, subject, groupsOf(table, logs, request.by, ledger.devicesAtLeast()));
+    std::vector<Group> groups = groupsOf(table, logs, request.by, ledger.devicesAtLeast());
+    if (request.leavesSmallOut) {
+      std::erase_if(groups, [&](const Group& group) {
+        return group.isSmall || !ledger.hasEnough(group.logs);
+      });
+    }
+    Division division = divide(ledger, subject, std::move(groups));
     if (request.by == GroupBy::kNone) division.groups.clear();
     answer.sides.push_back(answers.answer(std::move(title), division));
   };

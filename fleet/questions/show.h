@@ -29,6 +29,8 @@ struct ShowRequest {
   /// first side is the logs of all other ones.
   std::optional<DayRange> againstDays{};
   std::optional<std::string> againstVersion{};
+  /// Leaves groups of too few devices out of the whole, instead of joining them.
+  bool leavesSmallOut = false;
 };
 
 /// Of a scalar: the values of the logs, one a day and device.

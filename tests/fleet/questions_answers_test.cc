@@ -4,6 +4,7 @@
 #include <map>
 #include <random>
 
+#include "fleet/pages/fleet_page.h"
 #include "fleet/questions/compare.h"
 #include "fleet/questions/show.h"
 #include "fleet/questions/summary.h"
@@ -120,6 +121,21 @@ void expectNothingSmallFollows(const Ledger& ledger) {
     for (const auto& [in, logs] : cells)
       EXPECT_TRUE(ledger.hasEnough(logs)) << subject;
   }
+}
+
+TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
+  TestFleet fleet;
+  for (int device = 0; device < 43; ++device)
+    fleet.add(1, device < 3 ? "4.0" : device < 28 ? "4.1" : "4.2").scalars = {{"s", device}};
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 10);
+  const FleetPage page = askForPage(fleet.engine(), ledger, {});
+  expectNothingSmallFollows(ledger);
+  EXPECT_EQ(page.comparison->comparisons.size(), 1u);
+  EXPECT_THAT(titles(page.statistics.at(0).sides.at(0).groups),
+              ElementsAre("4.1 25/25", "4.2 15/15"));
+  EXPECT_EQ(page.statistics[0].sides[0].whole.logs, 40u);
+  EXPECT_FALSE(show(fleet.engine(), ledger, {.key = "s"}).sides[0].isShown) << "all less the shown";
 }
 
 TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {

@@ -4,6 +4,7 @@
 
 #include "device_services.h"
 #include "faulty_file_system.h"
+#include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/json_line.h"
 #include "platform/linux/logs/log_file_name.h"
@@ -157,6 +158,24 @@ TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
       EXPECT_EQ(after.submission.logs(Place::Outbox)->size(), names.size() + 1);
       ASSERT_LT(call, 200);
     }
+  }
+}
+
+TEST(Submission, NoTaskingChangesThePermission) {
+  const TemporaryRoot device;
+  for (const bool isGiven : {true, false}) {
+    permit(device, isGiven, kToday);
+    LinuxPlatform run(device.root);
+    Preferences& guarded = run.platform().preferences;
+    for (const char* const key : {"DiagnosticSubmissionEnabled", "DiagnosticSubmissionFirstDay"}) {
+      for (const plist::Value& value : {plist::Value(!isGiven), plist::Value(0), plist::Value()})
+        guarded.ZTXPreferencesSetValue(key, value, "com.norvane.zentrix");
+    }
+    const auto of = [&](const char* key) {
+      return run.preferences().ZTXPreferencesGetValue(key, "com.norvane.zentrix");
+    };
+    EXPECT_EQ(of("DiagnosticSubmissionEnabled"), plist::Value(isGiven));
+    EXPECT_EQ(of("DiagnosticSubmissionFirstDay"), plist::Value(kToday));
   }
 }
 

@@ -59,10 +59,10 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   EXPECT_NE(device.run("status").out.find("no log for day " + text(today - 1) + ": submission is " +
                                           allowed(today + 1)),
             std::string::npos);
-  device.check("allow --from yesterday",
-               {0, "submission is " + allowed(today - 1) + "\n",
-                "tavrelctl: what was recorded from day " + text(today - 1) +
-                    " on may leave, before this moment too\n"});
+  device.check(
+      "allow --from yesterday",
+      {0, "submission is " + allowed(today - 1) + "\n",
+       "tavrelctl: this includes what is already recorded, from day " + text(today - 1) + " on\n"});
 
   // A clock that is behind what is recorded.
   device.run("deny");
@@ -172,10 +172,12 @@ TEST_F(Consent, ErasesDaysOrAll) {
   fileLogs({"pending/a", "outbox/a", "withheld/b", "refused/c"});
   for (const char* damaged : {".corrupt-X", "-kept-damaged"})
     device.write(kStore + damaged, "x");
-  device.check("erase --key a", fails("nobody can be asked here: give --yes to erase", 2));
-  for (const char* wrong : {"", " --all --key a", " --all --from 1 --to 2"}) {
-    device.check(std::string("erase --yes") + wrong,
-                 fails("name what to erase: --all, or --key PREFIX, --from DAY and --to DAY", 2));
+  device.check("erase --key a", fails("not a terminal: add --yes to erase without asking", 2));
+  device.check("erase --yes",
+               fails("name what to erase: --all, or --key PREFIX, --from DAY and --to DAY", 2));
+  for (const char* more : {" --key a", " --from 1 --to 2"}) {
+    device.check(std::string("erase --yes --all") + more,
+                 fails("--all erases everything: leave --key, --from and --to out", 2));
   }
   device.check("erase --yes --from 5 --to 4",
                fails("no days: 5 (1970-01-06) is after 4 (1970-01-05)", 2));

@@ -43,12 +43,13 @@ struct Counter {
   }
 
   /// `gap`: why some of it may not have been seen; empty when all was.
-  Check check(std::string_view name, const CheckFigureKind& kind, const std::string& gap) const {
+  Check check(std::string_view name, std::string_view whenNone, const CheckFigureKind& kind,
+              const std::string& gap) const {
     if (sum == 0 && !gap.empty()) return {name, "", CheckState::Unknown, gap};
     return {name,
             "",
             sum > 0 ? CheckState::Warning : CheckState::Ok,
-            sum > 0 ? "since yesterday: " + text : "none since yesterday",
+            sum > 0 ? "since yesterday: " + text : format("%s since yesterday", whenNone),
             {{&kind, sum}}};
   }
 };
@@ -112,10 +113,10 @@ void checkCounters(CheckScene& scene, const Expected<std::optional<SegmentFolder
     const auto listing = (*folder)->list();
     if (listing && hasClosedSegments(*listing)) gap = kClosedSegments;
   }
-  Check limits = reached.check("limits", kReached, gap);
+  Check limits = reached.check("limits", "nothing removed", kReached, gap);
   judgeTidying(scene, limits);
   scene.checks.push_back(std::move(limits));
-  scene.checks.push_back(lost.check("lost-values", kLost, gap));
+  scene.checks.push_back(lost.check("lost-values", "none", kLost, gap));
 }
 
 // Since a fold last took values. Everything that waits is gone at the next start of the system, so

@@ -47,7 +47,8 @@ std::optional<Scope> scopeOf(ToolContext& context, const Arguments& given) {
   const bool hasPrefix = !given.prefix.empty();
   std::string fault;
   if (given.all == (hasPrefix || hasDays)) {
-    fault = "name what to erase: --all, or --key PREFIX, --from DAY and --to DAY";
+    fault = given.all ? "--all erases everything: leave --key, --from and --to out"
+                      : "name what to erase: --all, or --key PREFIX, --from DAY and --to DAY";
   } else if (hasDays && (given.from.empty() || given.to.empty())) {
     fault = "give both --from DAY and --to DAY: both days are erased, too";
   }
@@ -83,7 +84,7 @@ std::optional<Scope> scopeOf(ToolContext& context, const Arguments& given) {
 bool isConfirmed(ToolContext& context, const Scope& scope, bool yes) {
   if (yes) return true;
   if (!context.canAsk()) {
-    context.failUsage("nobody can be asked here: give --yes to erase");
+    context.failUsage("not a terminal: add --yes to erase without asking");
     return false;
   }
   context.error() << "Erase " << printable(scope.text) << " below "
@@ -244,7 +245,8 @@ void run(ToolContext& context, const Arguments& arguments) {
   Erased erased;
   const Status done = erase(context, *scope, erased);
   if (!done) {
-    return context.fail(format("not everything is erased: %s; run it again", done.error().message));
+    return context.fail(
+        format("not everything is erased: %s, then run it again", done.error().message));
   }
   print(context, *scope, erased);
   noteWhatStays(context, *scope, erased);

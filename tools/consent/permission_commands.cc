@@ -125,8 +125,7 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   }
   printAllowed(context, permission, true);
   if (*first <= today) {
-    context.note(format("what was recorded from day %s on may leave, before this moment too",
-                        dayText(*first)));
+    context.note(format("this includes what is already recorded, from day %s on", dayText(*first)));
   } else if (!isNamed && *first - 1 > today) {
     context.note(
         format("day %s is recorded already, though today is %s: submission begins after "

@@ -79,7 +79,7 @@ void makePage(ToolContext& context, const Arguments& arguments) {
 std::string faultOfDays(const std::string& text) {
   const auto days = parseWord(text);
   if (days && *days >= 1 && *days <= kMostDays) return {};
-  return format("--days takes 1 to %u, not %s", kMostDays, text);
+  return format("takes 1 to %u, not %s", kMostDays, text);
 }
 
 }  // namespace
@@ -99,7 +99,7 @@ void addPageCommand(Command app, ToolContext& context) {
   command
       .addOption("--day", arguments->day,
                  "The day of the figures: today, yesterday, a day number or YYYY-MM-DD, UTC "
-                 "(default: the last whole day with statistics)")
+                 "(default: the last day before today with statistics)")
       .typeName("DAY");
   command.onRun([&context, arguments] { makePage(context, *arguments); });
 }

@@ -70,6 +70,10 @@ void writeScalarRow(page::Table& table, const ScalarRow& row) {
 }
 
 void writeNoDay(const PageScene& scene, page::HtmlWriter& html, std::string_view what) {
+  if (!scene.recorded.fault.empty()) {
+    html.element("p", format("Not known: %s", scene.recorded.fault));
+    return;
+  }
   html.element("p",
                format("The device recorded no %s on %s.", what, dayDateText(scene.recorded.day)));
 }

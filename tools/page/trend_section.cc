@@ -119,7 +119,8 @@ void writeTrends(PageScene& scene) {
   page::HtmlWriter& html = scene.document.section(format("Trends over %s", counted(days, "day")));
   const std::vector<Trend> trends = trendsOf(scene);
   if (trends.empty()) {
-    html.element("p", "The device recorded nothing on these days.");
+    html.element("p", recorded.fault.empty() ? "The device recorded nothing on these days."
+                                             : format("Not known: %s", recorded.fault));
     return;
   }
   html.element("p",

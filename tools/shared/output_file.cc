@@ -15,6 +15,7 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
     output.out() << bytes;
     return Done{};
   }
+  if (file.empty()) return Error{"--output is empty: name a file, or - for standard output"};
   // Replacing a device or a pipe by a file is never intended.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
