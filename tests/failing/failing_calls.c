@@ -1,4 +1,5 @@
-/* Preloaded into a program by script/failing-calls: lets one call of a kind fail, or all from it on.
+/* Preloaded into a program by script/failing-calls: lets one call of a kind fail, or all from it
+ * on.
  *
  *   FAILING_KIND    allocation, open, read, write, flush, rename, map or truncate
  *   FAILING_AT      which call of that kind, from 1; "12+" is the twelfth and all later ones
@@ -55,11 +56,11 @@ static bool fails(enum Kind called, int error) {
 }
 
 /* The function of the C library. Found while it is called, as dlsym itself may allocate. */
-#define REAL(name)                                 \
-  static __typeof__(&name) real = NULL;            \
-  if (real == NULL) {                              \
-    void* const found = dlsym(RTLD_NEXT, #name);   \
-    memcpy(&real, &found, sizeof real);            \
+#define REAL(name)                               \
+  static __typeof__(&name) real = NULL;          \
+  if (real == NULL) {                            \
+    void* const found = dlsym(RTLD_NEXT, #name); \
+    memcpy(&real, &found, sizeof real);          \
   }
 
 extern void* __libc_malloc(size_t size);

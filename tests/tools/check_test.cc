@@ -135,10 +135,14 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
             std::string::npos);
   device.write("/etc/tavrel/limits.plist", "garbage");
-  expect("WARNING limits: nothing removed since yesterday; " + device.path("/etc/tavrel/limits.plist"), 1);
+  expect(
+      "WARNING limits: nothing removed since yesterday; " + device.path("/etc/tavrel/limits.plist"),
+      1);
   std::filesystem::remove(device.path("/etc/tavrel/limits.plist"));
   device.write("/var/lib/tavrel/tidy-failures", "no room\nnor time\n");
-  expect("WARNING limits: nothing removed since yesterday; 'tavrelctl tidy' failed 0 s ago: no room\n", 1);
+  expect(
+      "WARNING limits: nothing removed since yesterday; 'tavrelctl tidy' failed 0 s ago: no room\n",
+      1);
   std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);
   std::filesystem::remove(device.path(store + "-wal"));
