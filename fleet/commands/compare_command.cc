@@ -50,7 +50,7 @@ std::string leftOutText(const CompareAnswer& answer) {
   const auto add = [&](std::size_t count, const std::string& why) {
     if (count != 0) text += "  " + counted(count, "statistic") + " " + why + "\n";
   };
-  add(answer.missing, "not in both versions");
+  add(answer.missing, "without logs of both versions on these days");
   add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
                          " devices, or close to a set that was shown");
   add(answer.unfit, "with values that are no finite numbers");

@@ -63,11 +63,31 @@ DayRange Question::readDays(std::string_view text) const {
   return *days;
 }
 
+namespace {
+
+bool isDigit(char c) {
+  return c >= '0' && c <= '9';
+}
+
+// "4.1" is no part of "4.10" or "14.1".
+bool hasPart(std::string_view version, std::string_view part) {
+  if (part.empty()) return false;
+  for (std::size_t at = 0; (at = version.find(part, at)) != std::string_view::npos; ++at) {
+    const std::size_t end = at + part.size();
+    const bool cutsBefore = at > 0 && isDigit(version[at - 1]) && isDigit(part.front());
+    const bool cutsAfter = end < version.size() && isDigit(version[end]) && isDigit(part.back());
+    if (!cutsBefore && !cutsAfter) return true;
+  }
+  return false;
+}
+
+}  // namespace
+
 std::string Question::readVersion(std::string_view text) const {
   if (table_.number(Attribute::kOs, text)) return std::string(text);
   const std::string* found = nullptr;
   for (const std::string& version : table_.texts(Attribute::kOs)) {
-    if (version.find(text) == std::string::npos) continue;
+    if (!hasPart(version, text)) continue;
     if (found != nullptr) {
       throw std::runtime_error("version \"" + printable(text) +
                                "\" is part of several versions: write the whole of one of them");

@@ -26,7 +26,7 @@ bool takeSidecar(ReadItem& item) {
   const auto metadata =
       bytes ? readMetadataFile(asBytes(*bytes)) : Expected<LogMetadata>(bytes.error());
   if (!metadata) {
-    refuse(item, "its metadata " + metadata.error().message);
+    refuse(item, "its metadata: " + metadata.error().message);
     return false;
   }
   source.metadata = *metadata;

@@ -268,7 +268,7 @@ bool LogBuilder::addCell(const plist::Number& count) {
   const auto interval = parseIntervalLabel(inner_);
   if (!interval) return fail("the label is not an interval");
   if (count.kind() == plist::NumberKind::UInt64 || count.int64() < 0) {
-    return fail("the count is not one of values");
+    return fail("the count is negative");
   }
   if (!addRow()) return false;
   record_.cells.push_back({entry_, interval->lower, interval->upper, inner_,
@@ -303,7 +303,7 @@ bool LogBuilder::integer(const plist::Number& number) {
       return true;
     case Place::kNumbers:
       if (numberCount_ != 4) return addNumber(number.real());
-      if (isLarge || number.int64() < 0) return fail("its count is not one of values");
+      if (isLarge || number.int64() < 0) return fail("its count is negative");
       count_ = static_cast<std::uint64_t>(number.int64());
       ++numberCount_;
       return true;

@@ -180,9 +180,9 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;
   if (leftOut != 0) {
     html.element("p",
-                 countText(leftOut) +
-                     " statistics are left out: they are not in both versions, are of too few "
-                     "devices, or have values that are no finite numbers.",
+                 "Left out: " + countText(leftOut) + (leftOut == 1 ? " statistic" : " statistics") +
+                     " not in both versions, of too few devices, or with values that are no finite "
+                     "numbers.",
                  {{"class", "note"}});
   }
 }

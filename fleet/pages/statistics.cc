@@ -161,7 +161,9 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
     html.end();
   }
   if (hidden != 0) {
-    html.element("p", countText(hidden) + " statistics are of too few devices to be shown.",
+    html.element("p",
+                 "Not shown: " + countText(hidden) + (hidden == 1 ? " statistic" : " statistics") +
+                     " of too few devices.",
                  {{"class", "note"}});
   }
 }

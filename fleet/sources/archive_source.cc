@@ -82,7 +82,7 @@ class Archive {
  private:
   void note() {
     const char* const words = archive_error_string(archive_.get());
-    failure_ = format("cannot be read on: %s", words != nullptr ? words : "it is damaged");
+    failure_ = format("the rest cannot be read: %s", words != nullptr ? words : "it is damaged");
   }
 
   struct Free {

@@ -174,7 +174,7 @@ TEST_F(LoadTest, TakesArchives) {
             (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
   EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 1 refused\n");
   const Outcome cut = run({at("cut.tar")});
-  EXPECT_NE(cut.error.find("refused: cut.tar: cannot be read on: "), std::string::npos)
+  EXPECT_NE(cut.error.find("refused: cut.tar: the rest cannot be read: "), std::string::npos)
       << cut.error;
   EXPECT_EQ(cut.status, 1);
   // A file of a gigabyte in an archive of some kilobytes.

@@ -144,7 +144,7 @@ TEST(LogReaderTest, NamesWhatIsWrong) {
       {"<integer>4</integer>", "<integer>4</integer><integer>4</integer>",
        "BHDistributions/com.example.delay: is not an array of five numbers"},
       {"<integer>4</integer>", "<integer>-4</integer>",
-       "BHDistributions/com.example.delay: its count is not one of values"},
+       "BHDistributions/com.example.delay: its count is negative"},
       {"<integer>4</integer>", "<integer>2147483648</integer>",
        "BHDistributions/com.example.delay: its count exceeds 31 bits"},
       {"<integer>4</integer>", "<integer>0</integer>",
