@@ -166,7 +166,10 @@ void addSummaryCommand(Command top, FleetContext& context) {
   summary.addFlag("--keys", options->keys, "List all statistics instead");
   summary.onRun([&context, options] {
     ask(context, *options, [&](Question& question) {
-      if (options->keys) return printKeys(context, *options, question.engine().keys());
+      if (options->keys) {
+        return printKeys(context, *options,
+                         shownKeys(question.engine(), question.ledger(), question.days()));
+      }
       const SummaryAnswer answer = summarise(question.engine(), question.ledger(), question.days());
       if (context.json()) return context.printJson(summaryJson(answer));
       if (options->csv) return printCsv(context.out(), answer);

@@ -1,23 +1,58 @@
 #include "fleet/questions/summary.h"
 
+#include <span>
+#include <vector>
+
 #include "fleet/questions/grouping.h"
 
 namespace tavrel::fleet {
 
 namespace {
 
-CountedGroup countedGroup(const LogTable& table, const std::string& title, const LogSet& logs) {
+CountedGroup countedGroup(const Ledger& ledger, const std::string& title, const LogSet& logs) {
+  const LogTable& table = ledger.table();
   CountedGroup result{title, logs.logs(), logs.devices(table), 0, 0};
+  const std::vector<std::size_t> counts = logs.logsByDay(table);
   bool isFirst = true;
-  logs.forEach([&](LogIndex log) {
-    if (isFirst) result.firstDay = table.day(log);
+  for (std::size_t i = 0; i < counts.size(); ++i) {
+    if (counts[i] < ledger.devicesAtLeast()) continue;
+    if (isFirst) result.firstDay = table.days()[i].day;
     isFirst = false;
-    result.lastDay = table.day(log);
-  });
+    result.lastDay = table.days()[i].day;
+  }
   return result;
 }
 
+bool hasEnough(Engine& engine, const Ledger& ledger, const DayRange& days, const Key& key) {
+  const LogTable& table = ledger.table();
+  LogSet logs(table);
+  const auto take = [&](const auto& rows) {
+    for (const auto& row : rows) {
+      const LogIndex log = table.find(row.log);
+      if (log != kNoLog && days.contains(table.day(log))) logs.insert(log);
+    }
+  };
+  switch (key.kind) {
+    case KeyKind::kScalar:
+      engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
+      break;
+    case KeyKind::kDistribution:
+      engine.distributions(key.name, [&](std::span<const DistributionValue> rows) { take(rows); });
+      break;
+    case KeyKind::kHistogram:
+      engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
+      break;
+  }
+  return ledger.hasEnough(logs);
+}
+
 }  // namespace
+
+std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const DayRange& days) {
+  std::vector<Key> keys = engine.keys();
+  std::erase_if(keys, [&](const Key& key) { return !hasEnough(engine, ledger, days, key); });
+  return keys;
+}
 
 SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days) {
   const LogTable& table = ledger.table();
@@ -34,13 +69,13 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days) {
     if (!division.isShown) return answer;
     SummaryPart part{by, {}, division.joined};
     for (const Group& group : division.groups) {
-      part.groups.push_back(countedGroup(table, group.title, group.logs));
+      part.groups.push_back(countedGroup(ledger, group.title, group.logs));
     }
     answer.parts.push_back(std::move(part));
   }
   answer.isShown = true;
-  answer.whole = countedGroup(table, "all", logs);
-  for (const Key& key : engine.keys()) {
+  answer.whole = countedGroup(ledger, "all", logs);
+  for (const Key& key : shownKeys(engine, ledger, days)) {
     std::size_t& count = key.kind == KeyKind::kScalar         ? answer.scalarKeys
                          : key.kind == KeyKind::kDistribution ? answer.distributionKeys
                                                               : answer.histogramKeys;

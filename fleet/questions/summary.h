@@ -15,8 +15,8 @@ namespace tavrel::fleet {
 struct CountedGroup {
   std::string title;
   std::size_t logs = 0;
-  std::size_t devices = 0;  ///< the largest number of its logs on one day
-  std::int32_t firstDay = 0;
+  std::size_t devices = 0;    ///< the largest number of its logs on one day
+  std::int32_t firstDay = 0;  ///< with enough devices
   std::int32_t lastDay = 0;
 };
 
@@ -36,6 +36,9 @@ struct SummaryAnswer {
   std::size_t distributionKeys = 0;
   std::size_t histogramKeys = 0;
 };
+
+/// The statistics that enough devices have on these days. Reads all rows. Throws EngineError.
+std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const DayRange& days);
 
 /// Throws EngineError.
 SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days);

@@ -136,6 +136,12 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
               ElementsAre("4.1 25/25", "4.2 15/15"));
   EXPECT_EQ(page.statistics[0].sides[0].whole.logs, 40u);
   EXPECT_FALSE(show(fleet.engine(), ledger, {.key = "s"}).sides[0].isShown) << "all less the shown";
+
+  fleet.add(2, "4.2").scalars = {{"rare", 1}};
+  const LogTable later(fleet.engine());
+  const SummaryAnswer summary = summarise(fleet.engine(), *std::make_unique<Ledger>(later, 10), {});
+  EXPECT_EQ(summary.whole.lastDay, 1) << "the second day has one device";
+  EXPECT_EQ(summary.scalarKeys, 1u);
 }
 
 TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
