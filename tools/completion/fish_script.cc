@@ -9,7 +9,7 @@ constexpr std::string_view kQuoteEscape = "\\'";
 
 constexpr std::string_view kBegin = R"(# fish completion for tavrelctl. Generated: do not edit.
 
-# The command that the line names so far, and the arguments behind it.
+# The command that the line names so far, and the arguments after it.
 function __tavrelctl_words
     set -l words (commandline -opc)
     set -l path
