@@ -37,7 +37,7 @@ uncover() {
 
 # What waits since the power cut goes with the first upload.
 nginx
-systemctl stop tavrel-fold.path tavrel-upload.path tavrel-collect.timer
+systemctl stop tavrel-fold.path tavrel-upload.path tavrel-sampler.service
 expect "units with their folders" "$all_work" "$(outcomes)"
 expect "nothing waits any more" "" "$(logs pending)$(logs outbox)"
 # It keeps files open for writing.
@@ -133,4 +133,4 @@ upload: success 0" \
 uncover $folders
 
 expect "units with their folders again" "$all_work" "$(outcomes)"
-systemctl start tavrel-fold.path tavrel-upload.path tavrel-collect.timer
+systemctl start tavrel-fold.path tavrel-upload.path tavrel-sampler.service

@@ -6,9 +6,6 @@ for unit in tavrel.service tavrel-.service; do
   mkdir -p "/run/systemd/system/$unit.d"
   printf '[Service]\nSlice=tavrel.slice\n' >"/run/systemd/system/$unit.d/slice.conf"
 done
-# Samples are asked for without a pause.
-mkdir -p /run/systemd/system/tavrel-collect.service.d
-printf '[Unit]\nStartLimitIntervalSec=0\n' >/run/systemd/system/tavrel-collect.service.d/often.conf
 # A random delay would begin anew with each jump of the clock.
 for timer in daily fold upload; do
   mkdir -p "/run/systemd/system/tavrel-$timer.timer.d"
@@ -29,21 +26,22 @@ apt-get install -qq -y --no-install-recommends "$packages"/tavrel_*.deb \
   "$packages"/python3-brimhold_*.deb >/root/apt.log 2>&1
 expect "packages are installed" 0 "$?"
 settle
-units="tavrel-collect.timer
-tavrel-daily.timer
+units="tavrel-daily.timer
 tavrel-fold-shutdown.service
 tavrel-fold.path
 tavrel-fold.timer
 tavrel-health.timer
+tavrel-sampler.service
 tavrel-upload-boot.timer
 tavrel-upload.path
 tavrel-upload.timer
 tavrel.socket"
 expect "what is enabled" "$units" \
   "$(systemctl list-unit-files --no-legend --state=enabled 'tavrel*' | awk '{print $1}' | sort)"
-expect "what is active: no process" "$units" "$(systemctl list-units --no-legend --plain \
+expect "what is active" "$units" "$(systemctl list-units --no-legend --plain \
   --state=active 'tavrel*' | awk '{print $1}' | grep -Ev '^tavrel(-folders.service|.slice)$' | sort)"
-expect "processes" 1 "$(wc -w </sys/fs/cgroup/tavrel.slice/keeps-slice.service/cgroup.procs)"
+expect "processes: the sampler" tavrelctl \
+  "$(sed 's,.*,/proc/&/comm,' /sys/fs/cgroup/tavrel.slice/tavrel*/cgroup.procs | xargs cat)"
 expect "folder of those who record" "1770 root brimhold" "$(stat -c '%a %U %G' /run/tavrel/stat)"
 systemctl start tavrel-daily.service
 expect "a run in 1970" "success 0" "$(outcome tavrel-daily.service)"

@@ -27,7 +27,8 @@ expect "their version" "$later_version" "$(dpkg-query -W -f '${Version}\n' tavre
   tavrel-upload libbrimhold1 python3-brimhold | sort -u)"
 expect "all is configured" "" "$(dpkg --audit)"
 expect "an upgrade keeps the statistics" "$before" "$(exported)"
-expect "the timers run on" 6 "$(systemctl list-units --no-legend --plain --state=active \
+expect "the timers run on" 5 "$(systemctl list-units --no-legend --plain --state=active \
   'tavrel-*.timer' | wc -l)"
+expect "so does the sampler" active "$(systemctl is-active tavrel-sampler.service)"
 expect "the service's socket" socket "$(stat -c %F $socket)"
 record 7

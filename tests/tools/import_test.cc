@@ -296,6 +296,50 @@ struct SlowPace final : CollectPace {
   Ticks time;
 };
 
+// Waits as long as asked, and ends a run after some readings.
+struct PeriodicPace final : CollectPace {
+  Ticks now() override { return time; }
+  bool endsBefore(Ticks end) override {
+    time = end;
+    between();
+    return left-- == 0;
+  }
+
+  std::function<void()> between;
+  int left = 0;
+  Ticks time{std::chrono::hours(1)};
+};
+
+TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
+  const TemporaryDevice device;
+  device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
+  const std::filesystem::path state = device.path("/run/tavrel/collect.state");
+  PeriodicPace pace;
+  int received = 0;  // KiB, 30 more before each reading
+  bool isLeft = false;
+  pace.between = [&] {
+    isLeft = isLeft || std::filesystem::exists(state);
+    device.write("/proc/net/dev",
+                 "\n\neth0: " + std::to_string(1024 * (received += 30)) + " 0 0 0 0 0 0 0 0 0\n");
+  };
+  std::istringstream in;
+  std::ostringstream out, error;
+  for (const int readings : {2, 2}) {
+    ToolContext context({.in = in, .out = out, .error = error});
+    context.setRoot(device.path(""));
+    pace.left = readings;
+    collectEvery(context, std::chrono::seconds(60), "", pace);
+    EXPECT_TRUE(std::filesystem::exists(state));
+  }
+  EXPECT_EQ(out.str() + error.str(), "");
+  EXPECT_FALSE(isLeft) << "what a killed run leaves would count twice";
+  const std::string all = exported(device);
+  // The second run counts what came between the last reading of the first and its own.
+  for (const char* values : {"usage.network.received_kib=120 ", "usage.samples=4 ",
+                             "received_kib_per_second=0.5 ", "received_kib_per_second=1 "})
+    EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
+}
+
 TEST(CollectState, IsOfThisStartAndNoOlderThanADay) {
   using namespace std::chrono_literals;
   const TemporaryDevice device;

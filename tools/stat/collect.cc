@@ -27,21 +27,21 @@ using Ticks = CollectPace::Ticks;
 
 constexpr std::size_t kReadingsPerTransaction = 60;
 
-// Of the number of processes only the latest is kept.
-constexpr std::uint64_t kReadingsPerCount = 60;
+// Of the number of processes only the latest is kept: readings of each second leave it out.
+constexpr std::uint64_t kSecondsPerCount = 60;
 
 // Reads the machine, and computes values from each reading and the one before.
 class Collector {
  public:
-  Collector(ToolContext& context, ValueRecorder& recorder)
-      : sources_(context.root()), recorder_(recorder) {}
+  Collector(ToolContext& context, ValueRecorder& recorder, std::uint64_t readingsPerCount)
+      : sources_(context.root()), recorder_(recorder), readingsPerCount_(readingsPerCount) {}
 
   void startFrom(CollectState state) { last_ = std::move(state); }
 
   void read(std::chrono::nanoseconds at) {
     const ValueTime time = valueTimeNow();
     const auto processes =
-        count_ % kReadingsPerCount == 0 ? Processes::Counted : Processes::LeftOut;
+        count_ % readingsPerCount_ == 0 ? Processes::Counted : Processes::LeftOut;
     CollectState now{.at = at, .machine = sources_.read(processes), .remainders = {}};
     const MachineReading* const before = last_ ? &last_->machine : nullptr;
     const double secondsBetween = last_ ? std::chrono::duration<double>(at - last_->at).count() : 0;
@@ -113,6 +113,7 @@ class Collector {
 
   MachineSources sources_;
   ValueRecorder& recorder_;
+  const std::uint64_t readingsPerCount_;
   std::optional<CollectState> last_;
   std::vector<TimedValue> values_;
   std::size_t waiting_ = 0;  // readings
@@ -162,7 +163,7 @@ class EndSignals final : public CollectPace {
 void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace& pace) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
-  Collector collector(context, **recorder);
+  Collector collector(context, **recorder, kSecondsPerCount);
   const Ticks start = pace.now();
   std::uint32_t second = 0;
   bool endsEarly = false;
@@ -192,27 +193,76 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
   collectStatistics(context, seconds, signals);
 }
 
+namespace {
+
+// The reading that a run leaves for the next one.
+class LastReading {
+ public:
+  LastReading(ToolContext& context, const std::string& file)
+      : path_(file.empty() ? context.root().path("/run/tavrel/collect.state") : file),
+        boot_(bootIdentity(context.root())) {}
+
+  /// Lets `collector` go on from it. One that cannot be used is noted.
+  void giveTo(Collector& collector, ToolContext& context, std::chrono::nanoseconds now) const {
+    auto state = readCollectState(path_, boot_, now);
+    if (!state) {
+      context.note(format("this sample has no rates: %s", state.error().message));
+    } else if (*state) {
+      collector.startFrom(std::move(**state));
+    }
+  }
+
+  Status replace(const Collector& collector) const {
+    return writeCollectState(path_, boot_, collector.state());
+  }
+
+  Status remove() const { return removeCollectState(path_); }
+
+ private:
+  const std::string path_;
+  const std::string boot_;
+};
+
+}  // namespace
+
 void collectOnce(ToolContext& context, const std::string& stateFile) {
-  const std::string path =
-      stateFile.empty() ? context.root().path("/run/tavrel/collect.state") : stateFile;
-  const std::string boot = bootIdentity(context.root());
-  const std::chrono::nanoseconds now = std::chrono::steady_clock::now().time_since_epoch();
-  auto before = readCollectState(path, boot, now);
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
-  Collector collector(context, **recorder);
-  if (!before) {
-    context.note(format("this sample has no rates: %s", before.error().message));
-  } else if (*before) {
-    collector.startFrom(std::move(**before));
-  }
+  const LastReading last(context, stateFile);
+  Collector collector(context, **recorder, 1);
+  const std::chrono::nanoseconds now = std::chrono::steady_clock::now().time_since_epoch();
+  last.giveTo(collector, context, now);
   collector.read(now);
   // The state comes first: when the run is killed before it has kept the values, those are lost.
   // The other way the next run would count them again.
-  Status done = writeCollectState(path, boot, collector.state());
-  if (!done) return context.fail(done.error().message);
-  done = collector.keep();
+  Status done = last.replace(collector);
+  if (done) done = collector.keep();
   if (!done) context.fail(done.error().message);
+}
+
+void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile,
+                  CollectPace& pace) {
+  const auto recorder = openRecorder(context);
+  if (!recorder) return context.fail(recorder.error().message);
+  const LastReading last(context, stateFile);
+  Collector collector(context, **recorder, 1);
+  Ticks due = pace.now();
+  last.giveTo(collector, context, due.time_since_epoch());
+  // After a kill nothing may count again what this run has counted.
+  Status done = last.remove();
+  for (; done; due = std::max(due + period, pace.now())) {
+    if (pace.endsBefore(due)) break;
+    collector.read(pace.now().time_since_epoch());
+    if (collector.isFull()) done = collector.keep();
+  }
+  if (done && collector.count() > 0) done = last.replace(collector);
+  if (done) done = collector.keep();
+  if (!done) context.fail(done.error().message);
+}
+
+void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile) {
+  EndSignals signals;
+  collectEvery(context, period, stateFile, signals);
 }
 
 }  // namespace tavrel

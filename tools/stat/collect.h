@@ -32,4 +32,13 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds);
 /// in `stateFile`; an empty name is the device's own.
 void collectOnce(ToolContext& context, const std::string& stateFile);
 
+/// Reads the machine now and once in each `period`, until a signal ends it or values cannot be
+/// kept. Goes on from `stateFile` as `collectOnce` does, and leaves its last reading there at a
+/// signal.
+void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile,
+                  CollectPace& pace);
+
+/// The same by this machine's clock, until SIGINT or SIGTERM comes.
+void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile);
+
 }  // namespace tavrel

@@ -23,6 +23,7 @@ struct Arguments {
   std::string day;
   std::uint32_t seconds = 5;
   bool once = false;
+  std::optional<std::uint32_t> period;  // seconds
   std::string stateFile;
   std::optional<std::uint32_t> days;
 };
@@ -48,13 +49,21 @@ Command addCommand(Command group, const char* name, const char* description,
   return command;
 }
 
-// What is wrong with the text of --days; nothing when it is good.
+bool isPositiveNumber(const std::string& text) {
+  std::uint32_t number = 0;
+  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), number);
+  return fault == std::errc{} && end == text.data() + text.size() && number > 0;
+}
+
+// What is wrong with the text of --days and --every; nothing when it is good.
 std::string daysFault(const std::string& text) {
-  std::uint32_t days = 0;
-  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), days);
-  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
-  if (isNumber && days > 0) return {};
+  if (isPositiveNumber(text)) return {};
   return format("not a number of days: %s: give 1 or more", text);
+}
+
+std::string periodFault(const std::string& text) {
+  if (isPositiveNumber(text)) return {};
+  return format("not a number of seconds: %s: give 1 or more", text);
 }
 
 void addKey(Command command, Arguments& arguments) {
@@ -125,23 +134,37 @@ void addStatCommands(Command app, ToolContext& context) {
       .check(daysFault);
   context.addJsonOption(shown);
 
-  const Command collected =
-      addCommand(group, "collect", "Sample this machine once a second into today's statistics",
-                 arguments, context, [](ToolContext& tool, const Arguments& given) {
-                   if (given.once) return collectOnce(tool, given.stateFile);
-                   if (!given.stateFile.empty()) return tool.failUsage("--state needs --once");
-                   collectStatistics(tool, given.seconds);
-                 });
+  const Command collected = addCommand(
+      group, "collect", "Sample this machine once a second into today's statistics", arguments,
+      context, [](ToolContext& tool, const Arguments& given) {
+        if (given.once) return collectOnce(tool, given.stateFile);
+        if (given.period) {
+          return collectEvery(tool, std::chrono::seconds(*given.period), given.stateFile);
+        }
+        if (!given.stateFile.empty()) {
+          return tool.failUsage("--state needs --once or --every");
+        }
+        collectStatistics(tool, given.seconds);
+      });
   const Option seconds =
       collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
           .typeName("N");
+  const Option once = collected
+                          .addFlag("--once", arguments->once,
+                                   "Take one sample, with rates since the last run of this kind")
+                          .excludes(seconds);
   collected
-      .addFlag("--once", arguments->once,
-               "Take one sample, with rates since the last run of this kind")
-      .excludes(seconds);
+      .addOption("--every", arguments->period,
+                 "Take a sample every N seconds until a signal comes, going on from the last run "
+                 "of this kind or of --once")
+      .typeName("N")
+      .check(periodFault)
+      .excludes(seconds)
+      .excludes(once);
   collected
       .addOption("--state", arguments->stateFile,
-                 "What --once leaves for the next run (default /run/tavrel/collect.state)")
+                 "What --once and --every leave for the next run "
+                 "(default /run/tavrel/collect.state)")
       .typeName("FILE");
   collected.setFooter(std::string(collectedKeysHelp()));
 }
