@@ -14,6 +14,7 @@ exported() { tavrelctl stat export | grep -F com.example. | sort; }
 before=$(exported)
 if [ "$extent" = whole ]; then
   # The second package is being unpacked, the first is not configured.
+  : >/root/dpkg.log
   dpkg --unpack "$later"/*.deb >/root/dpkg.log 2>&1 &
   dpkg=$!
   until grep -q '^Unpacking tavrel:* ' /root/dpkg.log; do :; done
