@@ -7,6 +7,7 @@
 #include <random>
 #include <set>
 #include <sys/mount.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/vfs.h>
 #include <thread>
@@ -611,14 +612,32 @@ TEST_F(FoldTest, AProgramNoticesThatAFullFileSystemHasRoomAgain) {
 TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
   run([] { add(1); });
   const auto opened = SegmentFolder::open(DeviceRoot(root));
-  const auto segment = (*opened)->openSegment((*opened)->list()->segments.at(0));
-  EXPECT_TRUE((*opened)->openToAcknowledge(**segment));
+  const auto opening = (*opened)->openSegment((*opened)->list()->segments.at(0));
+  const auto& segment = opening->segment;
+  EXPECT_TRUE((*opened)->openToAcknowledge(*segment));
   const std::string path = segments().at(0);
   std::filesystem::copy_file(path, root / "copy");
   std::filesystem::rename(root / "copy", path);
-  EXPECT_FALSE((*opened)->openToAcknowledge(**segment));
-  EXPECT_FALSE((*opened)->remove(**segment));
+  EXPECT_FALSE((*opened)->openToAcknowledge(*segment));
+  EXPECT_FALSE((*opened)->remove(*segment));
 }
+TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
+  run([] { add(1); });
+  const auto opened = SegmentFolder::open(DeviceRoot(root));
+  const auto listing = (*opened)->list();
+  rlimit files{};
+  getrlimit(RLIMIT_NOFILE, &files);
+  const rlimit none{0, files.rlim_max};
+  setrlimit(RLIMIT_NOFILE, &none);
+  const auto opening = (*opened)->openSegment(listing->segments.at(0));
+  setrlimit(RLIMIT_NOFILE, &files);
+  ASSERT_FALSE(opening);
+  EXPECT_EQ(opening.error().message,
+            "cannot open " + segments().at(0) +
+                ": Too many open files; raise the number of files that a process may open "
+                "(ulimit -n)");
+}
+
 
 }  // namespace
 }  // namespace tavrel

@@ -1,4 +1,7 @@
 // What programs record, as the tool shows and folds it.
+#include <map>
+#include <sys/resource.h>
+
 #include "brimhold/client.h"
 #include "device.h"
 
@@ -56,6 +59,35 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   EXPECT_NE(failed.error.find("; what programs recorded waits for the next fold\n"),
             std::string::npos)
       << failed;
+}
+
+// However few files may be open, all is shown, or a line says what could not be read.
+TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
+  const TemporaryDevice device;
+  device.run("stat import", "scalar\t2\tapp.old\t1\n");
+  const std::filesystem::path folder = device.path("/run/tavrel/stat");
+  std::filesystem::create_directories(folder);
+  inChild([&] {
+    setenv("TAVREL_ROOT", device.path("").c_str(), 1);
+    BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
+    return 0;
+  });
+  const auto whole = device.run("stat list");
+  rlimit files{};
+  getrlimit(RLIMIT_NOFILE, &files);
+  std::map<std::string, int> said;
+  for (rlim_t most = 3; most < 50; ++most) {
+    const rlimit few{most, files.rlim_max};
+    setrlimit(RLIMIT_NOFILE, &few);
+    const Outcome listed = device.run("stat list");
+    setrlimit(RLIMIT_NOFILE, &files);
+    ++said[listed.error];
+    EXPECT_TRUE(listed.status == 1 || listed == whole) << most << ": " << listed;
+    EXPECT_EQ(std::ranges::count(listed.error, '\n'), listed.status) << most << ": " << listed;
+  }
+  constexpr std::string_view kAdvice =
+      ": Too many open files; raise the number of files that a process may open (ulimit -n)\n";
+  EXPECT_EQ(said[format("tavrelctl: cannot open %s%s", folder.string(), kAdvice)], 1);
 }
 
 }  // namespace

@@ -13,6 +13,8 @@ std::string_view adviceFor(int code) {
     case ENOSPC:
     case EDQUOT:
       return "; free some space";
+    case EMFILE:
+      return "; raise the number of files that a process may open (ulimit -n)";
     case EROFS:
       return "; make the file system writable";
     default:

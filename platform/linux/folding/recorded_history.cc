@@ -92,6 +92,10 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
   RecordedHistory history;
   history.selection_ = std::move(selection);
   const auto folder = SegmentFolder::open(root);
+  if (!folder) {
+    if (!SegmentFolder::isOutOfReach(root)) return folder.error();
+    history.warning_ = folder.error().message + "; what waits to be folded is not shown";
+  }
   for (int attempt = 0; attempt < kAttempts; ++attempt) {
     const timespec mark = FoldNotes::lastMark(root);
     auto stored = store.openHistory();

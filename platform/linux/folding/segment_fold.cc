@@ -137,18 +137,20 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
 }
 
 Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
-  auto segment = folder_.openSegment(entry);
-  if (!segment) {
+  auto opening = folder_.openSegment(entry);
+  if (!opening) return opening.error();
+  if (!opening->segment) {
+    if (opening->refusal.empty()) return Done{};
     unseen_.insert(entry.owner);
-    refuse(segment.error().message);
+    refuse(opening->refusal);
     return Done{};
   }
-  if (!*segment) return Done{};
-  const std::uint32_t owner = (*segment)->entry.owner;
-  SegmentReader reader((*segment)->file.get());
+  OpenSegment& segment = *opening->segment;
+  const std::uint32_t owner = segment.entry.owner;
+  SegmentReader reader(segment.file.get());
   const SegmentFacts facts = reader.facts();
   // Asked first: what is read after the last writer has gone is all that there is.
-  const bool isWriterGone = findSegmentWriter((*segment)->file.get(), facts) == SegmentWriter::Gone;
+  const bool isWriterGone = findSegmentWriter(segment.file.get(), facts) == SegmentWriter::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state) {
@@ -156,7 +158,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     return Done{};
   }
   if (*state == SegmentReader::State::Empty) {
-    if (isWriterGone) folded_.push_back({{}, *std::move(*segment), {}, true});
+    if (isWriterGone) folded_.push_back({{}, std::move(segment), {}, true});
     return Done{};
   }
   const SegmentName name{owner, facts.identity};
@@ -168,7 +170,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     ++report_.waiting;
     return Done{};
   }
-  return takeValues(batch, *std::move(*segment), reader, name, isWriterGone);
+  return takeValues(batch, std::move(segment), reader, name, isWriterGone);
 }
 
 bool FoldRun::mustWait(const SegmentName& name) {

@@ -9,6 +9,7 @@
 #include <random>
 #include <sys/vfs.h>
 #include <system_error>
+#include <unistd.h>
 
 #include "base/limits.h"
 #include "base/text.h"
@@ -24,6 +25,11 @@ constexpr std::string_view kSegmentEnding = ".segment";
 struct CloseFolder {
   void operator()(DIR* folder) const { closedir(folder); }
 };
+
+// Whether opening a file failed for a reason that lies outside of it.
+bool isSystemsFailure(int code) {
+  return code == EMFILE || code == ENFILE || code == ENOMEM || code == EIO;
+}
 
 // Why a file is no segment, judged from outside; nothing for one that may be.
 const char* faultOf(const struct stat& status, dev_t device) {
@@ -73,6 +79,13 @@ Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& roo
   if (fileSystem.f_type != TMPFS_MAGIC)
     return Error{path + " is not on a tmpfs: nothing is folded"};
   return std::optional(SegmentFolder(std::move(path), std::move(folder), status.st_dev));
+}
+
+bool SegmentFolder::isOutOfReach(const DeviceRoot& root) {
+  const std::string path = root.path(kFolderPath);
+  struct statfs fileSystem {};
+  if (access(path.c_str(), R_OK) != 0) return errno == EACCES;
+  return statfs(path.c_str(), &fileSystem) == 0 && fileSystem.f_type != TMPFS_MAGIC;
 }
 
 Expected<SegmentFolder::Listing> SegmentFolder::list() const {
@@ -128,25 +141,28 @@ Expected<SegmentFolder::Listing> SegmentFolder::list() const {
   return listing;
 }
 
-Expected<std::optional<OpenSegment>> SegmentFolder::openSegment(const SegmentEntry& entry) const {
-  const auto refuse = [&](std::string_view reason) { return Error{refusal(entry.name, reason)}; };
+Expected<SegmentOpening> SegmentFolder::openSegment(const SegmentEntry& entry) const {
+  const auto refuse = [&](std::string_view reason) {
+    return SegmentOpening{std::nullopt, refusal(entry.name, reason)};
+  };
   OpenSegment segment{entry,
                       Descriptor(openat(folder_.get(), entry.name.c_str(),
                                         O_RDONLY | O_NOFOLLOW | O_NONBLOCK | O_CLOEXEC)),
                       0, 0};
   if (!segment.file) {
-    if (errno == ENOENT) return std::optional<OpenSegment>();
+    if (errno == ENOENT) return SegmentOpening();
+    if (isSystemsFailure(errno)) return systemError("open", path_ + "/" + entry.name);
     return refuse(errno == ELOOP ? "a symbolic link" : std::generic_category().message(errno));
   }
   struct stat status {};
   if (fstat(segment.file.get(), &status) != 0) return refuse("it cannot be examined");
   // Removed since it was listed.
-  if (status.st_nlink == 0) return std::optional<OpenSegment>();
+  if (status.st_nlink == 0) return SegmentOpening();
   if (const char* const fault = faultOf(status, device_)) return refuse(fault);
   segment.entry.owner = status.st_uid;
   segment.device = status.st_dev;
   segment.inode = status.st_ino;
-  return std::optional(std::move(segment));
+  return SegmentOpening{std::move(segment), {}};
 }
 
 Descriptor SegmentFolder::openToAcknowledge(const OpenSegment& segment) const {

@@ -32,10 +32,18 @@ struct OpenSegment {
   ino_t inode = 0;
 };
 
+/// What came of opening a segment: nothing when it has gone.
+struct SegmentOpening {
+  std::optional<OpenSegment> segment;
+  std::string refusal;  // the line, for people, about a file that is refused
+};
+
 class SegmentFolder {
  public:
   /// Nothing when the device has no folder. An error when it is not on a tmpfs.
   static Expected<std::optional<SegmentFolder>> open(const DeviceRoot& root);
+  /// Whether `open` fails because this user may not read the folder, or nothing in it is folded.
+  static bool isOutOfReach(const DeviceRoot& root);
 
   const std::string& path() const { return path_; }
 
@@ -52,8 +60,9 @@ class SegmentFolder {
   /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all.
   Expected<Listing> list() const;
 
-  /// Opens a segment for reading. Nothing when it has gone. An error, for people, refuses it.
-  Expected<std::optional<OpenSegment>> openSegment(const SegmentEntry& entry) const;
+  /// Opens a segment for reading. An error says that the system cannot do so now: nothing is known
+  /// of the segment then.
+  Expected<SegmentOpening> openSegment(const SegmentEntry& entry) const;
   /// Opens the same file for writing.
   Descriptor openToAcknowledge(const OpenSegment& segment) const;
   /// Removes the name, unless it belongs to another file by now.

@@ -49,10 +49,11 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
       ++waiting.leftOut_;
       continue;
     }
-    const auto segment = folder.openSegment(entry);
+    const auto opening = folder.openSegment(entry);
+    if (!opening) return opening.error();
     // The fold tells what is refused.
-    if (!segment || !*segment) continue;
-    if (Status added = waiting.add(**segment, recorders, history, selection, rows, buffer);
+    if (!opening->segment) continue;
+    if (Status added = waiting.add(*opening->segment, recorders, history, selection, rows, buffer);
         !added) {
       return added.error();
     }
