@@ -13,7 +13,7 @@ Expected<RecordedHistory> openRecorded(ToolContext& context, RowSelection select
                       context.platform().propertyLists, context.platform().log);
   auto history = RecordedHistory::open(context.root(), context.storeForReading(), recorders,
                                        std::move(selection));
-  if (history && history->warning()) context.note(*history->warning());
+  if (history && history->warning()) context.fail(*history->warning());
   return history;
 }
 

@@ -245,7 +245,9 @@ Status printTable(ToolContext& context, RecordedHistory& history) {
   TableWriter table(lines, context.columns(), widestDay);
   const Status walked = walk(
       history, lines, [&](const Row& row) { table.add(row); }, [] {});
-  if (!table.finish() && walked) lines.buffer() += "no statistics\n";
+  // A line has said what could not be read.
+  const bool isWhole = walked && context.exitStatus() == kExitSuccess;
+  if (!table.finish() && isWhole) lines.buffer() += "no statistics\n";
   return walked;
 }
 
