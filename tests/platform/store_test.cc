@@ -2,6 +2,8 @@
 #include <bit>
 #include <csignal>
 #include <limits>
+#include <map>
+#include <set>
 #include <sqlite3.h>
 #include <sys/resource.h>
 
@@ -702,6 +704,96 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
     EXPECT_TRUE(store_->commit()) << "kept";
     EXPECT_EQ(log.lines, Lines{where() + "is not a regular file: move it away"});
   }
+}
+
+/// While it lives, one read of SQLite fails, or all from it on.
+class FailingReads {
+ public:
+  FailingReads(int at, bool andLater) {
+    system_ = sqlite3_vfs_find("unix");
+    vfs_ = *system_;
+    vfs_.zName = "failing";
+    vfs_.xOpen = open;
+    at_ = at;
+    andLater_ = andLater;
+    reads_ = 0;
+    sqlite3_vfs_register(&vfs_, 1);
+  }
+  ~FailingReads() {
+    sqlite3_vfs_unregister(&vfs_);
+    sqlite3_vfs_register(system_, 1);
+  }
+  static bool hasFailed() { return reads_ >= at_; }
+
+ private:
+  static int open(sqlite3_vfs*, const char* name, sqlite3_file* file, int flags, int* outFlags) {
+    const int code = system_->xOpen(system_, name, file, flags, outFlags);
+    if (code != SQLITE_OK) return code;
+    read_ = file->pMethods->xRead;
+    sqlite3_io_methods& methods =
+        methods_.try_emplace(file->pMethods, *file->pMethods).first->second;
+    methods.xRead = read;
+    file->pMethods = &methods;
+    return code;
+  }
+  static int read(sqlite3_file* file, void* into, int size, sqlite3_int64 offset) {
+    ++reads_;
+    const bool fails = reads_ == at_ || (andLater_ && reads_ > at_);
+    // What SQLite makes of EIO. Statements turn it into SQLITE_CORRUPT.
+    return fails ? SQLITE_IOERR_CORRUPTFS : read_(file, into, size, offset);
+  }
+
+  static inline sqlite3_vfs* system_ = nullptr;
+  static inline sqlite3_vfs vfs_{};
+  // The database's and the log's.
+  static inline std::map<const sqlite3_io_methods*, sqlite3_io_methods> methods_;
+  static inline decltype(sqlite3_io_methods::xRead) read_ = nullptr;
+  static inline int at_ = 0, reads_ = 0;
+  static inline bool andLater_ = false;
+};
+
+TEST_F(StoreTest, AFailingReadIsNoDamage) {
+  for (int i = 0; i < 3; ++i) {
+    set({{"k" + std::to_string(i), kToday, i}});
+    auto batch = store_->beginBatch();
+    ASSERT_TRUE((*batch)->appendValue(kToday, "d", 1, i) && (*batch)->commit());
+  }
+  const auto readAll = [&] {
+    const auto history = store_->initWithDefaultPath();
+    std::size_t found = scalars(*history, "k", kToday - 1, kToday).size();
+    history->distributionsForKeyPrefix(
+        "", kToday - 1, kToday,
+        [&](auto, auto, auto& values, auto&) { found += take(values).size(); });
+    return found;
+  };
+  std::set<std::string> said;
+  for (const bool writes : {false, true}) {
+    for (const bool andLater : {false, true}) {
+      for (int at = 1, hasFailed = 1; hasFailed != 0; ++at) {
+        SCOPED_TRACE(std::to_string(at) + (andLater ? "+" : "") + (writes ? ", written" : ""));
+        log.lines.clear();
+        {
+          const FailingReads reads(at, andLater);
+          store_ = open();
+          if (writes) store_->BHClientSetValueForScalarKey("w", at);
+          if (writes) store_->BHClientCheckpoint();
+          const std::size_t found = writes ? 6 : readAll();
+          EXPECT_TRUE(found == 6 || !log.lines.empty()) << found;
+          hasFailed = FailingReads::hasFailed();
+        }
+        said.insert(log.lines.begin(), log.lines.end());
+        EXPECT_EQ(setAsideFiles(), Lines{});
+        store_->BHClientCheckpoint();
+        EXPECT_EQ(readAll(), 6U);
+        EXPECT_EQ(scalars(*store_->initWithDefaultPath(), "w", kToday - 1, kToday),
+                  writes ? Rows({{"w", kToday, at}}) : Rows{});
+      }
+    }
+  }
+  EXPECT_EQ(corruptions(), 0);
+  EXPECT_TRUE(said.contains(where() + "looked damaged, but a second look found it sound: check "
+                                      "the file system that holds it, and the memory that is "
+                                      "free"));
 }
 
 TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {

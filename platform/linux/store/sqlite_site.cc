@@ -9,6 +9,7 @@
 
 #include "base/arithmetic.h"
 #include "platform/linux/files/stamp.h"
+#include "platform/linux/store/second_look.h"
 #include "platform/statistics_store.h"
 
 namespace tavrel {
@@ -94,6 +95,8 @@ void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) 
 
 std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
                                                 const StoreFailure& failure) const {
+  if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
+  if (auto doubt = doubtDamage(path, busy, changesNothing)) return doubt;
   if (changesNothing) {
     return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
   }

@@ -74,9 +74,10 @@ struct StoreSite {
   /// One line in the system log, with `consequence` at its end.
   void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
 
-  /// Moves a damaged store with its log files to names of their own, counts it and says so.
-  /// `damaged` is the file that was found damaged: nothing is done when another process has already
-  /// replaced it. Yields the failure; when the store could not be moved, with the reason.
+  /// Moves a damaged store with its log files to names of their own, counts it and says so, once a
+  /// second look has confirmed the damage. `damaged` is the file that was found damaged: nothing is
+  /// done when another process has already replaced it. Yields the failure; when the store could
+  /// not be moved, with the reason. No connection to the store may be open.
   std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
                                        const StoreFailure& failure) const;
 };

@@ -6,6 +6,7 @@
 #include <limits>
 #include <optional>
 #include <system_error>
+#include <utility>
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
@@ -139,8 +140,10 @@ void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
   const auto failure = attempt([&](const auto& identity) {
     // The store has just been set aside with its log.
     if (!identity) return;
-    if (!connection) connection = openForWriting(Sharing::Avoided);
-    if (!connection->checkpoint()) {
+    // Here, so that a failure closes it.
+    SqliteConnection own =
+        connection ? *std::exchange(connection, std::nullopt) : openForWriting(Sharing::Avoided);
+    if (!own.checkpoint()) {
       site_.log.write(LogLevel::Default,
                       site_.describe({StoreFault::Busy,
                                       "other processes still use the write-ahead log: what they "
