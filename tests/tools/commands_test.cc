@@ -189,6 +189,19 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
     EXPECT_EQ(device.run(reading).status, 1) << reading;
   EXPECT_EQ(device.files(), damaged);
 }
+  // What a failure makes incomplete fails.
+  const std::string preferences = device.path("/var/mobile/Library/Preferences/");
+  const std::string kept = contentOf(preferences + "com.norvane.tallied.plist");
+  std::ofstream(preferences + "com.norvane.tallied.plist") << "junk";
+  const Outcome incomplete = device.run("log preview --day 20000");
+  EXPECT_EQ(incomplete.status, 1);
+  EXPECT_EQ(incomplete.error, "tavrelctl: cannot read preferences " + preferences +
+                                  "com.norvane.tallied.plist: not a property list: it begins "
+                                  "neither with \"bplist00\" nor with \"<\"; repair it, or the "
+                                  "next write sets it aside\n");
+  EXPECT_EQ(device.run("log preview --day 20000 -v").status, 1);
+  std::ofstream(preferences + "com.norvane.tallied.plist") << kept;
+
 
 TEST(LogShow, SaysWhyThereIsNoLog) {
   const TemporaryDevice device;

@@ -133,8 +133,11 @@ void preview(ToolContext& context, const Arguments& arguments) {
   }
   const LogPreview preview = previewLog(context, day, onLine);
   // An incomplete document must not look like a whole one.
-  for (const std::string& error : preview.errors)
-    context.note(error);
+  if (!preview.errors.empty()) context.setExitStatus(kExitFailure);
+  if (!arguments.verbose) {
+    for (const std::string& error : preview.errors)
+      context.note(error);
+  }
   if (!preview.log) {
     return context.fail(
         format("no log would be submitted for day %s: %s", dayText(day), preview.reason));

@@ -14,11 +14,8 @@ LogPreview previewLog(
   overlay.setEventHandler([&](const OverlayEvent& event) {
     if (event.kind != OverlayEvent::Kind::LogLine) return;
     const std::string_view message = *event.value.string();
-    if (onLine) {
-      onLine(event.subject, message);
-    } else if (event.subject == "error") {
-      preview.errors.emplace_back(message);
-    }
+    if (onLine) onLine(event.subject, message);
+    if (event.subject == "error") preview.errors.emplace_back(message);
   });
   preview.osVersion = overlay.platform().submission->ZTXOSVersion();
   const LogOutcome outcome = BHReport(overlay.platform()).writeLogForYesterday(day, {});

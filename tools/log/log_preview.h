@@ -21,7 +21,7 @@ struct LogPreview {
   std::string osVersion;
 };
 
-/// `onLine`, when given, takes each line for the system log; errors are then not kept.
+/// `onLine`, when given, takes each line for the system log.
 LogPreview previewLog(
     ToolContext& context, std::int32_t day,
     const std::function<void(std::string_view level, std::string_view message)>& onLine = {});

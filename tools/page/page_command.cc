@@ -59,7 +59,8 @@ void makePage(ToolContext& context, const Arguments& arguments) {
   if (!recorded.fault.empty()) context.fail(recorded.fault);
   const LogPreview preview = previewLog(context, recorded.day);
   for (const std::string& error : preview.errors)
-    context.note(error);
+    context.fail(error);
+  if (preview.lacksWhitelist) context.note(preview.reason);
   const PageLog log = pageLogOf(context, preview, recorded.day);
 
   page::Document document(format("Device on %s", dayDateText(recorded.day)));
