@@ -175,8 +175,13 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   std::filesystem::remove(device.path(kWhitelistFile));
   device.check(
       "log preview --day 20000",
-      fails("Couldn't load whitelist\ntavrelctl: " + none + "20000 (2024-10-04): cannot read " +
-            device.path(kWhitelistFile) + ": No such file or directory"));
+      fails(none + "20000 (2024-10-04): cannot read " + device.path(kWhitelistFile) +
+            ": No such file or directory: write a whitelist, as docs/whitelist.md describes it"));
+  device.write(kWhitelistFile, "junk");
+  device.check("log preview --day 20000",
+               fails(none + "20000 (2024-10-04): " + device.path(kWhitelistFile) +
+                     ": not a property list: it begins neither with \"bplist00\" nor with \"<\": "
+                     "repair it, or replace it with another whitelist"));
 
   fill(device);
   LinuxPlatform(device.root).store().BHClientCheckpoint();

@@ -52,6 +52,10 @@ TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
                     "Logs that wait All empty", "recorded no scalar on " + yesterday,
                     "recorded nothing on these days", "No driver of this device tells",
                     "No drive of this device tells"});
+  EXPECT_EQ(device.run("page -o -").error,
+            "tavrelctl: cannot read " + device.path(kWhitelistFile) +
+                ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
+                "it\n");
   EXPECT_EQ(device.files(), TemporaryDevice().files());
 }
 

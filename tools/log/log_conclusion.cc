@@ -1,11 +1,14 @@
 #include "tools/log/log_conclusion.h"
 
+#include <cerrno>
 #include <nlohmann/json.hpp>
+#include <unistd.h>
 
 #include "base/arithmetic.h"
 #include "base/format.h"
 #include "base/limits.h"
 #include "config/bh_config.h"
+#include "platform/linux/files/device_root.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
@@ -28,15 +31,29 @@ Json LogConclusion::json() const {
           {"outcome", outcome ? Json(nameOf(*outcome)) : Json(nullptr)}};
 }
 
-namespace {
-
-// As the daemon reads it; it logs what is wrong with it.
-bool hasUsableWhitelist(Platform& platform) {
+WhitelistState whitelistState(ToolContext& context) {
+  Platform& platform = context.platform();
+  const std::string path = context.root().path(kWhitelistPath);
+  WhitelistState state;
+  // As the daemon reads it.
   const auto bytes = platform.files->read(kWhitelistPath, limits::kWhitelistBytes);
-  return bytes && platform.propertyLists->decode(asBytes(*bytes));
+  if (!bytes) {
+    const int obstacle = access(path.c_str(), R_OK) == 0 ? 0 : errno;
+    state.isMissing = obstacle == ENOENT;
+    state.isClosed = obstacle == EACCES;
+    state.isUsable = false;
+    state.fault = bytes.error().message;
+    if (state.isMissing) state.fault += ": write a whitelist, as docs/whitelist.md describes it";
+    return state;
+  }
+  const auto value = platform.propertyLists->decode(asBytes(*bytes));
+  state.isUsable = static_cast<bool>(value);
+  if (!value || !value->dictionary()) {
+    state.fault = format("%s: %s: repair it, or replace it with another whitelist", path,
+                         value ? "not a dictionary of groups" : value.error().message);
+  }
+  return state;
 }
-
-}  // namespace
 
 LogConclusion concludeOnLogs(ToolContext& context) {
   Platform& platform = context.platform();
@@ -48,9 +65,10 @@ LogConclusion concludeOnLogs(ToolContext& context) {
   const std::int32_t next = hasRun && lastDay >= previousDay(today) ? today : previousDay(today);
   LogConclusion conclusion;
   conclusion.permission = submissionPermission(preferences);
+  conclusion.whitelist = whitelistState(context);
   if (!conclusion.permission.covers(next)) {
     conclusion.outcome = LogOutcome::NotPermitted;
-  } else if (!hasUsableWhitelist(platform)) {
+  } else if (!conclusion.whitelist.isUsable) {
     conclusion.outcome = LogOutcome::NoWhitelist;
   }
   conclusion.isOfNextRun = conclusion.outcome.has_value();

@@ -12,11 +12,21 @@
 
 namespace tavrel {
 
+struct WhitelistState {
+  bool isMissing = false;
+  bool isClosed = false;  // to this user
+  bool isUsable = true;   // the daemon can read it
+  std::string fault;      // what is wrong with it, where, and what to do; empty for a good one
+};
+
+WhitelistState whitelistState(ToolContext& context);
+
 struct LogConclusion {
   bool isOfNextRun = false;           // otherwise of the last gated one
   std::optional<std::int32_t> day;    // nothing before the first run
   std::optional<LogOutcome> outcome;  // nothing when it is not known
   SubmissionPermission permission;
+  WhitelistState whitelist;
 
   /// "next" or "last".
   const char* run() const { return isOfNextRun ? "next" : "last"; }

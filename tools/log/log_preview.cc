@@ -2,6 +2,7 @@
 
 #include "platform/linux/linux_platform.h"
 #include "report/bh_report.h"
+#include "tools/log/log_conclusion.h"
 #include "tools/overlay/overlay_platform.h"
 
 namespace tavrel {
@@ -26,6 +27,12 @@ LogPreview previewLog(
   preview.reason = overlay.lastError();
   if (preview.reason.empty()) preview.reason = whyNoLog(outcome);
   if (!preview.errors.empty()) preview.errors.pop_back();
+  preview.lacksWhitelist = outcome == LogOutcome::NoWhitelist;
+  if (preview.lacksWhitelist) {
+    // The daemon's own lines lack the place, or what to do.
+    std::erase(preview.errors, "Couldn't load whitelist");
+    preview.reason = whitelistState(context).fault;
+  }
   return preview;
 }
 

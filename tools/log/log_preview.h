@@ -17,6 +17,7 @@ namespace tavrel {
 struct LogPreview {
   std::optional<CapturedLog> log;   // permission given or not; nothing when none would be made
   std::string reason;               // why there is none
+  bool lacksWhitelist = false;      // that is the reason
   std::vector<std::string> errors;  // that making it logged; the log may then lack something
   std::string osVersion;
 };
