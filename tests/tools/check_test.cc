@@ -104,6 +104,14 @@ TEST_F(CheckTest, TellsHowTheLastRunsWent) {
 
 TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   writeRun(kHour, true);
+  device.write(kWhitelistFile, "<plist>");
+  expect("WARNING last-log: the next run: no log for day " + std::to_string(today() - 1) + " (" +
+             isoAgo(kDay).substr(0, 10) + "): diagnostic submission not allowed; " +
+             device.path(kWhitelistFile) +
+             ": XML property list, line 1, column 8: no element found: repair it, or replace it "
+             "with another whitelist\n",
+         1);
+  std::filesystem::remove(device.path(kWhitelistFile));
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --force");
   expect("WARNING permission: DiagnosticSubmissionEnabled is a string, which counts as no", 1);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
@@ -114,7 +122,7 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   }
   device.run({"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionFirstDay", "--int",
               std::to_string(today() + 1)});
-  expect("OK permission: the daily log may leave the device, from day", 0);
+  expect("OK permission: the daily log may leave the device, from day", 1);
   device.run({"prefs", "set", "com.norvane.tallied.tavrel", "--int",
               "LastCrashLogSerializationDateInDaysSince1970", std::to_string(today())});
   expect("WARNING clock: today is day", 1);

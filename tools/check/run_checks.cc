@@ -143,6 +143,13 @@ void checkLastLog(CheckScene& scene) {
     check.state = CheckState::Unknown;
     check.text = "preferences cannot be read";
   }
+  // A device that sends nothing needs no whitelist, but a faulty one is somebody's mistake.
+  const WhitelistState& whitelist = conclusion.whitelist;
+  if (!whitelist.fault.empty() &&
+      !(whitelist.isMissing && conclusion.outcome == LogOutcome::NotPermitted)) {
+    addFinding(check, whitelist.isClosed ? CheckState::Unknown : CheckState::Warning,
+               whitelist.fault);
+  }
   scene.checks.push_back(std::move(check));
 }
 
