@@ -123,6 +123,14 @@ G/DistributionKeys/spoilt: spoilt on 2024-10-04: 1 of 15 values make mean and de
 TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
   const TemporaryDevice device;
   const std::string before = device.path("/old.plist");
+  const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+  std::filesystem::remove(device.path(store + "-wal"));
+  device.write(store, "no database");
+  device.check("whitelist check",
+               fails("statistics store " + device.path(store) +
+                         ": file is not a database: the file has to be set aside; the next run "
+                         "sets it aside; the whitelist is not checked against what is recorded",
+                     2));
   const std::string after = device.path("/new.plist");
   device.write("/old.plist", xmlOf(R"({
     "A": {"ScalarKeys": {"finer": {"sig_fig": 1}, "coarser": {}, "mixed": {"bucket_interval": 10},

@@ -52,7 +52,9 @@ void check(ToolContext& context, const Arguments& arguments) {
   if (!whitelist) return context.failUsage(whitelist.error().message);
   auto findings = checkWhitelist(whitelist->value);
   std::ranges::move(checkAgainstData(context, whitelist->value), std::back_inserter(findings));
-  if (!findings.empty()) context.setExitStatus(kExitFailure);
+  if (!findings.empty() && context.exitStatus() == kExitSuccess) {
+    context.setExitStatus(kExitFailure);
+  }
 
   std::string digest;
   appendHex(digest, context.platform().digest->md5(asBytes(whitelist->bytes)));
@@ -68,7 +70,7 @@ void check(ToolContext& context, const Arguments& arguments) {
     const std::string place = path.empty() ? whitelist->name : path;
     context.out() << printable(place + ": " + message) << '\n';
   }
-  if (findings.empty()) {
+  if (context.exitStatus() == kExitSuccess) {
     context.out() << printable(whitelist->name) << ": no findings (digest " << digest << ")\n";
   }
 }

@@ -96,9 +96,12 @@ std::optional<std::int32_t> dayToCheck(const std::vector<std::int32_t>& days, st
 
 std::vector<WhitelistFinding> checkAgainstData(ToolContext& context,
                                                const plist::Value& whitelist) {
+  const auto fail = [&](const Error& error) {
+    context.failUsage(error.message + "; the whitelist is not checked against what is recorded");
+  };
   auto history = context.storeForReading().openHistory();
   if (!history) {
-    context.note(history.error().message);
+    fail(history.error());
     return {};
   }
   if (!(*history)->hasStore()) return {};
@@ -113,7 +116,7 @@ std::vector<WhitelistFinding> checkAgainstData(ToolContext& context,
         [&](std::string_view key, std::int32_t of, std::int64_t,
             BHHistoryDistributionEnumerator& values, bool&) { check.look(key, of, values); });
   }
-  if (!read) context.note(read.error().message);
+  if (!read) fail(read.error());
   return std::move(check.findings);
 }
 

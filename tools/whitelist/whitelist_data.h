@@ -10,8 +10,8 @@
 namespace tavrel {
 
 /// Distributions of the last whole day in the store whose values the whitelist does not coarsen, or
-/// that a value which is not a number spoils; none without a store. Each value is read. A store
-/// that cannot be read is a note.
+/// that a value which is not a number spoils; none without a store. Each value is read. When the
+/// store cannot be read, a line says so, the exit status becomes 2, and findings may be missing.
 std::vector<WhitelistFinding> checkAgainstData(ToolContext& context, const plist::Value& whitelist);
 
 }  // namespace tavrel
