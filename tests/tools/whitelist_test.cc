@@ -1,4 +1,5 @@
 // tavrelctl whitelist
+#include <sys/stat.h>
 
 #include "device.h"
 
@@ -71,6 +72,10 @@ TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   device.write(kWhitelistFile, "<plist><dict>");
   device.check("whitelist check",
                fails(path + ": XML property list, line 1, column 14: no element found", 2));
+  std::filesystem::remove(path);
+  ASSERT_EQ(mkfifo(path.c_str(), 0600), 0);
+  device.check("whitelist check",
+               fails("cannot use " + path + ": it is not a regular file; move it away", 2));
   EXPECT_EQ(device.run("whitelist check -", xmlOf("[]")),
             (Outcome{1,
                      "standard input: is an array: a whitelist is a dictionary of groups: nothing "
@@ -118,11 +123,6 @@ G/DistributionKeys/fine: fine on 2024-10-04: intervals are finer than what is re
 G/DistributionKeys/spoilt: spoilt on 2024-10-04: 1 of 15 values make mean and deviation nan, as they are not numbers: mend the program that records them
 )",
           ""}));
-}
-
-TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
-  const TemporaryDevice device;
-  const std::string before = device.path("/old.plist");
   const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
   std::filesystem::remove(device.path(store + "-wal"));
   device.write(store, "no database");
@@ -131,6 +131,11 @@ TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
                          ": file is not a database: the file has to be set aside; the next run "
                          "sets it aside; the whitelist is not checked against what is recorded",
                      2));
+}
+
+TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
+  const TemporaryDevice device;
+  const std::string before = device.path("/old.plist");
   const std::string after = device.path("/new.plist");
   device.write("/old.plist", xmlOf(R"({
     "A": {"ScalarKeys": {"finer": {"sig_fig": 1}, "coarser": {}, "mixed": {"bucket_interval": 10},

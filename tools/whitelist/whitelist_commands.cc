@@ -11,6 +11,7 @@
 #include "base/text.h"
 #include "config/bh_config.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
 #include "tools/shared/input_file.h"
@@ -38,7 +39,10 @@ struct Whitelist {
 
 Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file) {
   const std::string path = file.empty() ? context.root().path(kWhitelistPath) : file;
-  auto bytes = readInput(context, path, limits::kWhitelistBytes);
+  // The device's own must be a file, as for the daemon; another may be a pipe.
+  auto bytes = file.empty()
+                   ? context.linuxPlatform().fileSystem().read(path, limits::kWhitelistBytes)
+                   : readInput(context, path, limits::kWhitelistBytes);
   if (!bytes) return bytes.error();
   const std::string name = path == "-" ? "standard input" : path;
   auto value = plist::read(asBytes(*bytes));
