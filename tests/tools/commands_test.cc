@@ -23,6 +23,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "not a preference domain: ../a: give a name such as com.example.app, without slashes"},
       {"log preview --day soon",
        "not a day: soon: give today, yesterday, a 32-bit day number or YYYY-MM-DD"},
+      {CommandLine{"prefs", "set", "a", "", "x"},
+       "a preference needs a key: the one given is empty"},
       {"prefs set a k x\x01", kNoXmlText},
       {"prefs set a k\xff x", kNoXmlText},
       {"prefs set a k [{\"\xEF\xBF\xBE\":1}] --plist", kNoXmlText},

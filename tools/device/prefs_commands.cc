@@ -127,6 +127,9 @@ void noteTextThatReadsOtherwise(ToolContext& context, const Arguments& arguments
 
 void set(ToolContext& context, const Arguments& arguments) {
   if (!checkDomain(context, arguments.domain)) return;
+  if (arguments.key.empty()) {
+    return context.failUsage("a preference needs a key: the one given is empty");
+  }
   const auto value = valueOf(context, arguments);
   if (!value) return context.failUsage(value.error().message);
   if (!isXmlText(arguments.key) || !hasXmlTextsOnly(*value)) {
