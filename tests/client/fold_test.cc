@@ -331,11 +331,17 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
       {recorders, 0644, 15, {"x"}, 3},
       {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
       {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
+      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},  // a link that leads nowhere
   };
   for (const auto& [content, mode, user, allowed, lines] : cases) {
     SCOPED_TRACE(user);
-    std::ofstream(file) << content;
-    chmod(file.c_str(), mode);
+    std::filesystem::remove(file);
+    if (content.empty()) {
+      std::filesystem::create_symlink("nowhere", file);
+    } else {
+      std::ofstream(file) << content;
+      chmod(file.c_str(), mode);
+    }
     std::filesystem::remove_all(root / "var");
     std::filesystem::remove(root / "run/tavrel/fold.lock");
     run([&, uid = user] {
@@ -348,6 +354,11 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
     const std::size_t refused = keys.size() - allowed.size();
     EXPECT_EQ(foldNow().refused, 2 * refused);
     EXPECT_EQ(log.lines.size(), lines) << testing::PrintToString(log.lines);
+    if (content.empty()) {
+      EXPECT_EQ(log.lines.at(0), file.string() +
+                                     " is ignored: it is a link that leads nowhere; "
+                                     "repair or remove it");
+    }
     look();
     EXPECT_EQ(figure("refused"), 2 * refused);
     Lines taken;
@@ -609,18 +620,6 @@ TEST_F(FoldTest, AProgramNoticesThatAFullFileSystemHasRoomAgain) {
   umount(folder.c_str());
 }
 
-TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
-  run([] { add(1); });
-  const auto opened = SegmentFolder::open(DeviceRoot(root));
-  const auto opening = (*opened)->openSegment((*opened)->list()->segments.at(0));
-  const auto& segment = opening->segment;
-  EXPECT_TRUE((*opened)->openToAcknowledge(*segment));
-  const std::string path = segments().at(0);
-  std::filesystem::copy_file(path, root / "copy");
-  std::filesystem::rename(root / "copy", path);
-  EXPECT_FALSE((*opened)->openToAcknowledge(*segment));
-  EXPECT_FALSE((*opened)->remove(*segment));
-}
 TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
   run([] { add(1); });
   const auto opened = SegmentFolder::open(DeviceRoot(root));
@@ -638,6 +637,18 @@ TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
                 "(ulimit -n)");
 }
 
+TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
+  run([] { add(1); });
+  const auto opened = SegmentFolder::open(DeviceRoot(root));
+  const auto opening = (*opened)->openSegment((*opened)->list()->segments.at(0));
+  const auto& segment = opening->segment;
+  EXPECT_TRUE((*opened)->openToAcknowledge(*segment));
+  const std::string path = segments().at(0);
+  std::filesystem::copy_file(path, root / "copy");
+  std::filesystem::rename(root / "copy", path);
+  EXPECT_FALSE((*opened)->openToAcknowledge(*segment));
+  EXPECT_FALSE((*opened)->remove(*segment));
+}
 
 }  // namespace
 }  // namespace tavrel

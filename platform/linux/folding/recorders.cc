@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <charconv>
 #include <optional>
 #include <pwd.h>
@@ -11,6 +12,7 @@
 #include "base/text.h"
 #include "client/segment_format.h"
 #include "platform/linux/files/property_list_file.h"
+#include "platform/linux/files/system_error.h"
 
 namespace tavrel {
 namespace {
@@ -42,7 +44,16 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
   Recorders recorders;
   const std::string path = root.path(kRecordersPath);
   const auto status = FileSystem::status(path);
-  if (!status) return recorders;
+  if (!status) {
+    struct stat link {};
+    if (lstat(path.c_str(), &link) == 0) {
+      log.log(LogLevel::Error,
+              "%s is ignored: it is a link that leads nowhere; repair or remove it", path);
+    } else if (errno != ENOENT && errno != ENOTDIR) {
+      log.write(LogLevel::Error, systemError("read", path).message);
+    }
+    return recorders;
+  }
   const bool isTrusted = (status->st_uid == 0 || status->st_uid == geteuid()) &&
                          (status->st_mode & (S_IWGRP | S_IWOTH)) == 0;
   if (!isTrusted) {
