@@ -199,6 +199,11 @@ TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
   expect("OK lost-values: none since yesterday\n", 1);
   device.run("stat import -", "scalar\ttoday\tcom.norvane.brimhold.dropped\t9\n");
   expect("WARNING lost-values: since yesterday: dropped 9\n", 1);
+  device.write("/etc/tavrel/recorders.plist", "<plist>");
+  expect("WARNING folding: no program records in memory; cannot read " +
+             device.path("/etc/tavrel/recorders.plist") +
+             ": XML property list, line 1, column 8: no element found; repair or remove it\n",
+         1);
 }
 
 TEST_F(CheckTest, JudgesNothingThatThisUserCannotSee) {

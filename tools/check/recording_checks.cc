@@ -8,6 +8,7 @@
 #include "base/arithmetic.h"
 #include "base/format.h"
 #include "base/quantity_text.h"
+#include "platform/linux/files/device_root.h"
 #include "platform/linux/folding/fold_notes.h"
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_folder.h"
@@ -54,11 +55,12 @@ struct Counter {
   }
 };
 
-Recorders recordersOf(CheckScene& scene) {
-  LinuxPlatform& device = scene.context.linuxPlatform();
-  return Recorders::read(scene.context.root(), device.fileSystem(), device.platform().propertyLists,
-                         device.platform().log);
-}
+struct FirstError final : SystemLog {
+  void write(LogLevel level, std::string_view message) override {
+    if (level == LogLevel::Error && text.empty()) text = message;
+  }
+  std::string text;
+};
 
 constexpr const char* kClosedSegments = "segments of other users cannot be read: run as root";
 
@@ -93,15 +95,16 @@ void judgeTidying(CheckScene& scene, Check& check) {
              std::string_view(**failures).substr(0, (*failures)->find('\n'))));
 }
 
-void checkCounters(CheckScene& scene, const Expected<std::optional<SegmentFolder>>& folder) {
+void checkCounters(CheckScene& scene, const Recorders& recorders,
+                   const Expected<std::optional<SegmentFolder>>& folder) {
   Counter reached{"com.norvane.tavrel.limits.", {}};
   Counter lost{"com.norvane.brimhold.", {}};
-  auto history = RecordedHistory::open(scene.context.root(), scene.context.storeForReading(),
-                                       recordersOf(scene),
-                                       {.key = "com.norvane.",
-                                        .firstDay = previousDay(scene.today),
-                                        .lastDay = scene.today,
-                                        .hasValues = false});
+  auto history =
+      RecordedHistory::open(scene.context.root(), scene.context.storeForReading(), recorders,
+                            {.key = "com.norvane.",
+                             .firstDay = previousDay(scene.today),
+                             .lastDay = scene.today,
+                             .hasValues = false});
   const Status read = history ? history->walkScalars([&](std::string_view key, std::int32_t,
                                                          std::int64_t value, bool&) {
     reached.add(key, value);
@@ -128,7 +131,7 @@ std::int64_t longestWait(const CheckScene& scene) {
   return std::min<std::int64_t>(uptime.tv_sec, scene.ageOf(mark.tv_sec));
 }
 
-Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
+Check foldingCheck(CheckScene& scene, const Recorders& recorders, const SegmentFolder& folder) {
   Check check{"folding"};
   const auto listing = folder.list();
   if (!listing) {
@@ -146,7 +149,7 @@ Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
   const auto history = scene.context.storeForReading().openHistory();
   const auto waiting =
       history ? WaitingValues::read(
-                    folder, recordersOf(scene), history->get(),
+                    folder, recorders, history->get(),
                     {.key = "", .firstDay = kFirstDay, .lastDay = kLastDay, .hasValues = false})
               : Expected<WaitingValues>(history.error());
   if (!waiting) {
@@ -176,17 +179,27 @@ Check foldingCheck(CheckScene& scene, const SegmentFolder& folder) {
 }  // namespace
 
 void checkRecording(CheckScene& scene) {
-  const auto folder = SegmentFolder::open(scene.context.root());
-  checkCounters(scene, folder);
+  const DeviceRoot& root = scene.context.root();
+  LinuxPlatform& device = scene.context.linuxPlatform();
+  FirstError fault;
+  const Recorders recorders =
+      Recorders::read(root, device.fileSystem(), device.platform().propertyLists, fault);
+  const auto folder = SegmentFolder::open(root);
+  checkCounters(scene, recorders, folder);
   if (!folder) {
     // Another user than root may not look.
-    const bool isClosed = access(scene.context.root().path("/run/tavrel/stat").c_str(), R_OK) != 0;
-    const auto state = isClosed ? CheckState::Unknown : CheckState::Critical;
+    const bool isUnseen = access(root.path("/run/tavrel/stat").c_str(), R_OK) != 0;
+    const auto state = isUnseen ? CheckState::Unknown : CheckState::Critical;
     scene.checks.push_back({"folding", "", state, folder.error().message});
   } else if (!*folder) {
     scene.checks.push_back({"folding", "", CheckState::Ok, "no program records in memory"});
   } else {
-    scene.checks.push_back(foldingCheck(scene, **folder));
+    scene.checks.push_back(foldingCheck(scene, recorders, **folder));
+  }
+  if (!fault.text.empty()) {
+    const bool isUnseen = isClosed(root.path("/etc/tavrel/recorders.plist"));
+    addFinding(scene.checks.back(), isUnseen ? CheckState::Unknown : CheckState::Warning,
+               fault.text);
   }
 }
 
