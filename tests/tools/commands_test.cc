@@ -48,6 +48,21 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   EXPECT_EQ(device.runAt("", "status"),
             fails("--root: names no folder: see 'tavrelctl status --help'", 2));
   EXPECT_FALSE(std::filesystem::exists(none));
+  // The journal takes the priority of a line from its beginning.
+  const std::pair<std::vector<std::string>, std::string> kJournal[] = {
+      {{"prefs", "set", "a", "k", "true"},
+       "<4>tavrelctl: stored as a string: true: use --bool for a boolean\n"},
+      {{"prefs", "get", "a", "b"},
+       "<3>tavrelctl: no preference b in domain a: 'tavrelctl prefs list a' shows what there "
+       "is\n"}};
+  for (const auto& [command, line] : kJournal) {
+    std::istringstream in;
+    std::ostringstream out, error;
+    std::vector<std::string> words{"--root", device.path("")};
+    words.insert(words.end(), command.begin(), command.end());
+    runTavrelctl(words, {.in = in, .out = out, .error = error, .errorIsJournal = true});
+    EXPECT_EQ(error.str(), line);
+  }
   device.check("--version", prints("tavrelctl 0.1.0\n"));
   for (const auto& help : {"--help", "prefs set --help", "log --help"})
     EXPECT_NE(device.run(help).out.find("Usage: "), std::string::npos) << help;
@@ -174,6 +189,19 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
       << verbose.error;
   EXPECT_EQ(device.files(), before);
 
+  // What a failure makes incomplete fails.
+  const std::string preferences = device.path("/var/mobile/Library/Preferences/");
+  const std::string kept = contentOf(preferences + "com.norvane.tallied.plist");
+  std::ofstream(preferences + "com.norvane.tallied.plist") << "junk";
+  const Outcome incomplete = device.run("log preview --day 20000");
+  EXPECT_EQ(incomplete.status, 1);
+  EXPECT_EQ(incomplete.error, "tavrelctl: cannot read preferences " + preferences +
+                                  "com.norvane.tallied.plist: not a property list: it begins "
+                                  "neither with \"bplist00\" nor with \"<\"; repair it, or the "
+                                  "next write sets it aside\n");
+  EXPECT_EQ(device.run("log preview --day 20000 -v").status, 1);
+  std::ofstream(preferences + "com.norvane.tallied.plist") << kept;
+
   std::filesystem::remove(device.path(kWhitelistFile));
   device.check(
       "log preview --day 20000",
@@ -196,19 +224,6 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
     EXPECT_EQ(device.run(reading).status, 1) << reading;
   EXPECT_EQ(device.files(), damaged);
 }
-  // What a failure makes incomplete fails.
-  const std::string preferences = device.path("/var/mobile/Library/Preferences/");
-  const std::string kept = contentOf(preferences + "com.norvane.tallied.plist");
-  std::ofstream(preferences + "com.norvane.tallied.plist") << "junk";
-  const Outcome incomplete = device.run("log preview --day 20000");
-  EXPECT_EQ(incomplete.status, 1);
-  EXPECT_EQ(incomplete.error, "tavrelctl: cannot read preferences " + preferences +
-                                  "com.norvane.tallied.plist: not a property list: it begins "
-                                  "neither with \"bplist00\" nor with \"<\"; repair it, or the "
-                                  "next write sets it aside\n");
-  EXPECT_EQ(device.run("log preview --day 20000 -v").status, 1);
-  std::ofstream(preferences + "com.norvane.tallied.plist") << kept;
-
 
 TEST(LogShow, SaysWhyThereIsNoLog) {
   const TemporaryDevice device;

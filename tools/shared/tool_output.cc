@@ -7,10 +7,15 @@
 #include <unistd.h>
 #include <utility>
 
+#include "platform/linux/system_log/linux_system_log.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
+
+// Of syslog.
+constexpr char kErrorPriority = '3';
+constexpr char kWarningPriority = '4';
 
 // Nothing when standard output is not a terminal; a terminal of unknown width counts as 80 columns.
 std::optional<std::size_t> terminalColumns() {
@@ -51,6 +56,7 @@ ToolStreams standardStreams() {
           .error = std::cerr,
           .columns = terminalColumns(),
           .errorIsTerminal = isatty(STDERR_FILENO) == 1,
+          .errorIsJournal = LinuxSystemLog().isJournal(),
           .inIsTerminal = isatty(STDIN_FILENO) == 1,
           .outIsColoured = isColoured()};
 }
@@ -63,18 +69,23 @@ void ToolOutput::printJson(Json object) {
   streams_.out << jsonText(withFormatVersion(std::move(object)), 2) << '\n';
 }
 
-void ToolOutput::note(std::string_view message) {
+void ToolOutput::say(char priority, std::string_view message) {
   streams_.out.flush();
+  if (streams_.errorIsJournal) streams_.error << '<' << priority << '>';
   streams_.error << program_ << ": " << printable(message) << '\n';
 }
 
+void ToolOutput::note(std::string_view message) {
+  say(kWarningPriority, message);
+}
+
 void ToolOutput::fail(std::string_view message) {
-  note(message);
+  say(kErrorPriority, message);
   exitStatus_ = kExitFailure;
 }
 
 void ToolOutput::failUsage(std::string_view message) {
-  note(message);
+  say(kErrorPriority, message);
   exitStatus_ = kExitUsage;
 }
 

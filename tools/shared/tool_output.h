@@ -37,6 +37,8 @@ struct ToolStreams {
   /// are then never cut.
   std::optional<std::size_t> columns = std::nullopt;
   bool errorIsTerminal = false;
+  /// Whether `error` is read by the journal, which takes the priority of a line from its beginning.
+  bool errorIsJournal = false;
   bool inIsTerminal = false;
   /// Whether `out` is a terminal that shows colours to a user who wants them.
   bool outIsColoured = false;
@@ -91,6 +93,8 @@ class ToolOutput {
   void setExitStatus(int status) { exitStatus_ = status; }
 
  private:
+  void say(char priority, std::string_view message);
+
   const char* program_;
   ToolStreams streams_;
   bool json_ = false;
