@@ -48,7 +48,9 @@ std::string argumentOf(const CommandModel& command, const OptionModel& option,
   std::string text = "(" + joined(option.names);
   for (const std::string& other : option.excludes)
     text += ' ' + other;
-  text += ")" + name + "[" + plain(option.description) + "]";
+  // "=" allows --name=VALUE beside --name VALUE.
+  const bool allowsBoth = !option.isFlag() && name.starts_with("--");
+  text += ")" + name + (allowsBoth ? "=" : "") + "[" + plain(option.description) + "]";
   return shellQuoted(option.isFlag() ? text : text + valueText(command, option));
 }
 
@@ -78,7 +80,7 @@ void addFunction(const CommandModel& command, std::string& script) {
     addFunction(below, script);
   script += functionName(command) + "() {\n";
   script +=
-      "  local -a root=('--root[Folder of the device]:DIR:_files -/' '--help[Show how it is "
+      "  local -a root=('--root=[Folder of the device]:DIR:_files -/' '--help[Show how it is "
       "used]')\n";
   if (!command.commands.empty()) {
     addGroup(command, script);
