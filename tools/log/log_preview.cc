@@ -16,7 +16,10 @@ LogPreview previewLog(
     if (event.kind != OverlayEvent::Kind::LogLine) return;
     const std::string_view message = *event.value.string();
     if (onLine) onLine(event.subject, message);
-    if (event.subject == "error") preview.errors.emplace_back(message);
+    // What the daemon says of a histogram that it leaves out is no error for it.
+    const bool isFault =
+        event.subject == "error" || message.starts_with("Couldn't allocate histCounts");
+    if (isFault) preview.errors.emplace_back(message);
   });
   preview.osVersion = overlay.platform().submission->ZTXOSVersion();
   const LogOutcome outcome = BHReport(overlay.platform()).writeLogForYesterday(day, {});
