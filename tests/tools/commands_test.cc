@@ -1,4 +1,5 @@
 // tavrelctl as a whole: usage, preferences, property lists, logs, status.
+#include "base/limits.h"
 #include "device.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -223,6 +224,19 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   for (const auto& reading : {"log preview --day 20000", "status", "stat list", "stat export"})
     EXPECT_EQ(device.run(reading).status, 1) << reading;
   EXPECT_EQ(device.files(), damaged);
+}
+
+TEST(LogList, SaysWhichLogCannotBeRead) {
+  const TemporaryDevice device;
+  const std::string name = "pending/log-tallied-20261127T180218Z-5f0c9a1e";
+  device.fileLog(name, "x", R"({"Name": "log-tallied"})");
+  const std::string path = device.path(kSubmission + name + ".log");
+  std::filesystem::resize_file(path, limits::kPropertyListBytes + 1);
+  const Outcome listed = device.run("log list");
+  EXPECT_EQ(listed.status, 1);
+  EXPECT_EQ(listed.error, format("tavrelctl: cannot use %s: it has more than %zu bytes; move it "
+                                 "away; the day of such a log is not shown\n",
+                                 path, limits::kPropertyListBytes));
 }
 
 TEST(LogShow, SaysWhyThereIsNoLog) {

@@ -177,10 +177,13 @@ void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs
                            std::string(kLogMetadataEnding);
   const auto bytes = context.linuxPlatform().fileSystem().read(path, limits::kPropertyListBytes);
   const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
-  std::string reason = value ? path + ": it is empty or no dictionary" : value.error().message;
+  const bool isThere = value && !value->dictionary().empty();
+  std::string reason = isThere ? path + ": it could not be read at first: run the command again"
+                       : value ? path + ": it is empty or no dictionary"
+                               : value.error().message;
   if (bytes && !value) reason = path + ": " + reason;
   // What is there and cannot be read is a failure; what is missing may be the rest of a kill.
-  if (!bytes && FileSystem::status(path)) context.setExitStatus(kExitFailure);
+  if (isThere || (!bytes && FileSystem::status(path))) context.setExitStatus(kExitFailure);
   context.note(format(
       "%s without metadata: %s",
       counted(static_cast<std::uint64_t>(std::count_if(logs.begin(), logs.end(), isBare)), "log"),

@@ -34,13 +34,15 @@ std::optional<std::int32_t> dayInText(std::string_view text) {
   return start ? dayOfLog({{"BHStartDate", *start}}) : std::nullopt;
 }
 
-// Metadata does not hold the day that a log reports.
-std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log) {
+// Metadata does not hold the day that a log reports. `unread` gets the first failure to read one.
+std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
+                                    std::optional<Error>& unread) {
   if (!log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName)) {
     return std::nullopt;
   }
   const auto bytes =
       context.linuxPlatform().fileSystem().read(log.path, limits::kPropertyListBytes);
+  if (!bytes && !unread && FileSystem::status(log.path)) unread = bytes.error();
   if (const auto day = bytes ? dayInText(*bytes) : std::nullopt) return day;
   const auto document = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(Error{});
   return document ? dayOfLog(document->dictionary()) : std::nullopt;
@@ -66,9 +68,10 @@ void listLogs(ToolContext& context, std::size_t most) {
                {"PLACE"},
                {"FILE", Table::Align::Whole}});
   Json entries = Json::array();
+  std::optional<Error> unread;
   for (const FiledLog& log : filed->logs) {
     const auto& status = log.status;
-    const auto day = readDay(context, log);
+    const auto day = readDay(context, log, unread);
     const bool isForced = isSurelyForced(log, day);
     if (context.json()) {
       Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
@@ -94,6 +97,7 @@ void listLogs(ToolContext& context, std::size_t most) {
     context.out() << counted(filed->older, "older log") << " not shown: see --all\n";
   }
   if (filed->unseen) return context.fail(filed->unseen->message);
+  if (unread) context.fail(unread->message + "; the day of such a log is not shown");
   noteMissingMetadata(context, filed->logs);
 }
 
