@@ -210,6 +210,34 @@ TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
   EXPECT_EQ(records["series"].size(), 10U);
 }
 
+// The process gives cells another day once they are folded. The store that knew how far is lost.
+TEST_F(FoldTest, ALostStoreMakesNoDayOfEarlierOnes) {
+  constexpr int kDays = 6;
+  const pid_t child = start([&] {
+    for (int day = 0; day < kDays; ++day) {
+      testClock().realtime = (kToday + day) * 86'400;
+      add(100);
+      record(day);
+      kill(getpid(), SIGSTOP);
+    }
+  });
+  for (int day = 0; day < kDays; ++day) {
+    waitpid(child, nullptr, WUNTRACED);
+    if (day == kDays - 2) {
+      std::ofstream(store(), std::ios::trunc) << std::string(9999, 'x');
+      std::filesystem::remove(store().string() + "-wal");
+    }
+    EXPECT_EQ(foldNow().refused, day == kDays - 2 ? 2U : 0U);
+    kill(child, SIGCONT);
+  }
+  EXPECT_EQ(waitFor(child), 0);
+  look();
+  EXPECT_EQ(scalar("count", kToday + kDays - 1), 100);
+  EXPECT_EQ(figure("refused"), 2);
+  EXPECT_EQ(scalars.size(), 2U);
+  expectEachOnce(kDays);
+}
+
 TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {
   const int processes = fromEnvironment("TAVREL_FOLD_PROCESSES", 6);
   const int folds = fromEnvironment("TAVREL_FOLD_FOLDS", 3);

@@ -84,6 +84,7 @@ Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
     return refused;
   }
   SegmentPosition position;
+  position.isKnown = true;
   position.dropped = *loadLittle64(bytes, 16);
   std::uint64_t at = kHeadBytes;
   for (std::uint32_t i = 0; i < usedCells; ++i, at += kCellBytes) {

@@ -33,8 +33,11 @@ struct SegmentPosition {
   std::vector<Chunk> chunks;
   std::uint64_t dropped = 0;  // values that the program lost, as far as they have been reported
   bool isEnd = false;         // nothing is left to fold, and never will be; the rest is empty
+  bool isKnown = false;       // whether a read or a store has told it
 
-  static SegmentPosition end() { return {.cells = {}, .chunks = {}, .isEnd = true}; }
+  static SegmentPosition end() {
+    return {.cells = {}, .chunks = {}, .isEnd = true, .isKnown = true};
+  }
   bool operator==(const SegmentPosition&) const = default;
 
   std::string encode() const;

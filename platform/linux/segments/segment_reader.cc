@@ -215,6 +215,7 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
     readChunks(reading, first, std::min(kChunksAtOnce, chunks - first));
   dropUnused(position.cells);
   dropUnused(position.chunks);
+  position.isKnown = true;
   return std::move(reading.progress);
 }
 
@@ -260,6 +261,12 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
     return;
   }
 
+  // Some fold has taken the cell's value, and its store is gone with the position. The cell may
+  // have got another time since, and nobody knows how much of the value belongs to that.
+  if (!reading.position.isKnown && now.acknowledged != 0) {
+    if (now.closes != now.acknowledged) ++reading.progress.refused;
+    folded = {now.sets, now.value};
+  }
   const bool isSet = now.sets != folded.sets;
   const std::int64_t value = isSet ? now.value : wrappingSubtract(now.value, folded.value);
   if (isSet || value != 0) {
