@@ -167,18 +167,23 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
   const Ticks start = pace.now();
   std::uint32_t second = 0;
   bool endsEarly = false;
+  Status kept = Done{};
   {
     StatProgress progress(context);
     for (;; ++second) {
       collector.read(pace.now().time_since_epoch());
       progress.show(format("collecting: %u of %u seconds", second, seconds));
-      endsEarly = second < seconds && pace.endsBefore(start + std::chrono::seconds(second + 1));
-      const bool isLast = second == seconds || endsEarly;
-      if (!isLast && !collector.isFull()) continue;
-      if (const Status kept = collector.keep(); !kept) return context.fail(kept.error().message);
-      if (isLast) break;
+      const bool isLast = second == seconds;
+      // Before the wait: a reading counts for the day on which it is made.
+      if (isLast || collector.isFull()) kept = collector.keep();
+      if (isLast || !kept) break;
+      endsEarly = pace.endsBefore(start + std::chrono::seconds(second + 1));
+      if (!endsEarly) continue;
+      kept = collector.keep();
+      break;
     }
   }
+  if (!kept) return context.fail(kept.error().message);
   context.out() << "kept " << counted(collector.count(), "sample")
                 << " of this machine, taken over " << counted(second, "second") << '\n';
   if (endsEarly) context.note(format("ended by a signal before %u seconds were over", seconds));
