@@ -5,6 +5,7 @@
 #include "platform/persisted_state.h"
 #include "report/histogram.h"
 #include "tests/fakes/fake_platform.h"
+#include "tests/fakes/fingerprint.h"
 
 namespace tavrel {
 namespace {
@@ -53,6 +54,18 @@ TEST_F(BHReportTest, WritesALogWithExactlyItsEntries) {
   ASSERT_EQ(fake.submission.logs.size(), 1U);
   EXPECT_EQ(fake.submission.logs[0].type + fake.submission.logs[0].name, "193log-tallied");
   EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{"writing tallied log. yesterday=19999"});
+}
+
+// On every processor: whatever its order of bytes and the size of its words.
+TEST_F(BHReportTest, ALogHasTheSameBitsEverywhere) {
+  fake.store.scalars = {{"exact", kDay, 9'223'372'036'854'775'807}, {"raw", kDay, -(1LL << 62)}};
+  std::vector<double> values{1e300, -0.0, 5e-324, 1e-300, 1e22, 10, 20};
+  for (int i = 1; i < 1000; ++i)
+    values.push_back(i * 0.1 + 1.0 / i);
+  fake.store.distributions = {{"bars", kDay, values},
+                              {"plain", kDay, {values.begin() + 5, values.end()}}};
+  write();
+  EXPECT_EQ(fakes::fingerprint(fake.submission.logs.at(0).content), 0x21DD10E09375F695U);
 }
 
 TEST_F(BHReportTest, CarriesAppInfoAndTasking) {

@@ -7,6 +7,7 @@
 
 #include "platform/linux/recorded/recorded_registry.h"
 #include "tests/fakes/fake_platform.h"
+#include "tests/fakes/fingerprint.h"
 
 namespace tavrel::fakes {
 
@@ -40,14 +41,6 @@ inline Bytes little32(std::uint32_t value) {
   Bytes out(4);
   storeLittle32(out, 0, value);
   return out;
-}
-
-/// FNV-1a of the rows of a table, to pin what was compared with its source once.
-inline std::uint64_t fingerprint(std::string_view text) {
-  std::uint64_t hash = 0xCBF29CE484222325;
-  for (const char c : text)
-    hash = (hash ^ static_cast<unsigned char>(c)) * 0x100000001B3;
-  return hash;
 }
 
 inline Data request(std::uint8_t selector, std::uint8_t flags) {
