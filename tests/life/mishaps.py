@@ -1,0 +1,243 @@
+"""What befalls a device in its life. Each function is one event; the names count in the summary."""
+
+import os
+
+from device import PREFERENCES, SECONDS_PER_DAY, STORE, SUBMISSION, WHITELIST
+from life import Life, expect
+from model import DA, LAST_RUN, OTHER, OWN, date_text
+
+LIMITS = "etc/tavrel/limits.plist"
+VERSION = "etc/tavrel/system-version.plist"
+SCALAR_OPTIONS = [{}, {"bucket_interval": 10}, {"sig_fig": 2}, {"bucket_interval": 7, "sig_fig": 1}]
+JUNK_FILES = ["var/lib/tavrel/last-run.plist", "run/tavrel/collect.state",
+              "var/lib/tavrel/tidy-failures", "var/lib/tavrel/edac-counters.plist",
+              "run/tavrel/notifications/com.norvane.da.tasking_changed"]
+
+
+class Mishaps(Life):
+    """How often a thousand days have each event is in EVENTS."""
+
+    repair_clock_at = None
+    uploads = True
+    spoiled = ()  # files that somebody repairs the next time
+
+    # -- The owner, and those who look after the device -----------------------------------------
+
+    def allow(self):
+        latest = max([*self.days_held(), 0])
+        arguments = ["--from", str(self.clock.today + 1)] if latest > self.clock.today else []
+        day = self.clock.today + 1
+        done = self.device.tool("allow", *arguments)
+        expect(done.out == f"submission is allowed from day {day} ({date_text(day)}) on\n",
+               done.out)
+        self.model.permitted, self.model.first_day = True, day
+
+    def deny(self):
+        if self.chance.random() < 0.5:
+            self.kill("tavrelctl", "deny")
+        self.device.tool("deny")
+        self.model.permitted, self.model.first_day = False, None
+        self.waiting, self.withheld = self.logs()
+        expect(not self.waiting, "logs wait after the permission was withdrawn")
+
+    def update_system(self):
+        self.updates += 1
+        self.model.version = {
+            "ProductName": "Pellio", "ProductVersion": f"{4 + self.updates // 10}.{self.updates}",
+            "ProductBuildVersion": f"16R{300 + self.updates}"}
+        self.device.write(VERSION, self.model.version)
+
+    def update_whitelist(self):
+        chance = self.chance
+        intervals = [{}, {"intervals": sorted(chance.sample(range(-50, 5000), 4))}]
+        self.model.whitelist = {
+            "Base": {"ScalarKeys": {f"com.example.s{i}": chance.choice(SCALAR_OPTIONS)
+                                    for i in chance.sample(range(4), 3)},
+                     "ScalarKeyPrefixes": {"com.example.": chance.choice(SCALAR_OPTIONS)},
+                     "DistributionKeyPrefixes": {"com.example.": chance.choice(intervals)}},
+            "Extra": {"ScalarKeyPrefixes": {"statsd.": chance.choice(SCALAR_OPTIONS)},
+                      "DistributionKeyPrefixes": {"statsd.": chance.choice(intervals)}},
+            "Device": {"ScalarKeys": {
+                "com.norvane.usage.samples": {},
+                "com.norvane.usage.cur_boot_session_cpu_uptime": {},
+                "com.norvane.lumenhall.DiskUsageUserTotalBlocks": {"sig_fig": 2},
+                "com.norvane.zentrix.bhd.database.corruptions": {},
+                "com.norvane.brimhold.segments_refused": {}},
+                "ScalarKeyPrefixes": {"com.norvane.tavrel.limits.": {}}}}
+        self.device.write(WHITELIST, self.model.whitelist)
+        self.model.whitelist_bytes = self.device.path(WHITELIST).read_bytes()
+
+    def spoil_whitelist(self):
+        self.device.write(WHITELIST, self.chance.randbytes(200))
+        self.model.whitelist = None
+        self.spoiled = (*self.spoiled, self.update_whitelist)
+
+    def tasking(self):
+        self.model.scheduled = {
+            "TaskingID": f"tasking-{self.clock.today}-{self.chance.randrange(999)}",
+            "TaskingDigest": self.chance.randbytes(4),
+            "TaskingPayload": self.chance.sample([
+                {"Domain": DA, "Key": "Extra", "Value": False},
+                {"Domain": DA, "Key": "AggressiveSubmissionDays",
+                 "Value": self.chance.randrange(1, 9)},
+                {"Domain": OTHER, "Key": "interval", "Value": self.chance.randrange(60)}], 2)}
+        self.device.write("tasking.plist", self.model.scheduled)
+        self.device.tool("tasking", "schedule", str(self.device.path("tasking.plist")))
+
+    def clear_tasking(self):
+        self.device.tool("tasking", "clear")
+        self.model.scheduled = None
+
+    def change_limits(self):
+        self.limits = {"Store": self.chance.randrange(20, 91),
+                       "Pending": self.chance.randrange(10, 61),
+                       "Outbox": self.chance.randrange(10, 61)}
+        self.limits_are_whole = True
+        self.device.write(LIMITS, {name: {"Days": days} for name, days in self.limits.items()})
+
+    def spoil_limits(self):
+        self.device.write(LIMITS, self.chance.choice([b"<plist>", b"", {"Stor": {"Days": 5}}]))
+        self.limits_are_whole = False
+        self.spoiled = (*self.spoiled, self.change_limits)
+
+    def server_away(self):
+        self.uploads = not self.uploads
+
+    def upload(self):
+        """As the uploader does once the server has confirmed a log: the log goes first."""
+        for place in ("pending", "outbox"):
+            for name in self.device.logs()[place]:
+                for ending in (".log", ".metadata.plist"):
+                    (self.device.path(SUBMISSION) / place / f"{name}{ending}").unlink()
+                self.waiting.discard(name)
+                self.count("logs uploaded")
+
+    def erase(self):
+        self.fold()
+        if self.chance.random() < 0.5:
+            self.device.tool("erase", "--key", "com.example.s1", "--yes")
+            self.model.stored.remove(prefix="com.example.s1")
+        else:
+            last = self.clock.today - self.chance.randrange(2, 30)
+            self.device.tool("erase", "--from", str(last - 3), "--to", str(last), "--yes")
+            self.model.stored.remove(days=set(range(last - 3, last + 1)))
+
+    def burst(self):
+        self.activity(count=4000)
+
+    # -- Clocks ---------------------------------------------------------------------------------
+
+    def clock_is_wrong(self, days, lasts):
+        if self.repair_clock_at is None:
+            self.clock.set_wrong(days * SECONDS_PER_DAY)
+            self.repair_clock_at = self.clock.true + lasts
+
+    def clock_ahead(self):
+        far = self.chance.random() < 0.5
+        self.clock_is_wrong(self.chance.randrange(30, 2000) if far else self.chance.randrange(1, 4),
+                            self.chance.randrange(3, 60) * 3600)
+
+    def clock_behind(self):
+        self.clock_is_wrong(-self.chance.randrange(1, 12), self.chance.randrange(3, 90) * 3600)
+
+    def clock_in_1970(self):
+        self.fold()
+        self.clock_is_wrong(-(self.clock.true // SECONDS_PER_DAY),
+                            self.chance.randrange(3, 50) * 3600)
+
+    def repair_clock(self):
+        self.clock.set_wrong(0)
+        self.repair_clock_at = None
+        # No run comes before the clock has passed the last one. Somebody who sees that helps.
+        if self.model.own.get(LAST_RUN, 0) > self.clock.today + 2:
+            self.model.own[LAST_RUN] = self.clock.today - 2
+            self.device.tool("prefs", "set", OWN, LAST_RUN, str(self.clock.today - 2), "--int")
+            self.count("last runs set right by hand")
+
+    # -- Faults -----------------------------------------------------------------------------------
+
+    def kill(self, *command):
+        """Kills a program before one of the calls that change files."""
+        return self.device.run(*command, kill_at=self.chance.randrange(
+            1, {"tavrel": 120}.get(command[0], 12)))
+
+    def killed_run(self):
+        self.disturbed_run(lambda: self.kill("tavrel", "-d"))
+
+    def killed_fold(self):
+        self.activity()
+        self.kill("tavrelctl", "stat", "fold")
+        self.fold()
+
+    def full_disk(self):
+        """Programs record and fold, and the daily run comes, while there is hardly any room."""
+        if not os.path.ismount(self.device.path("var")):
+            return
+        room = self.chance.choice([0, 4, 16, 36, 60, 80, 110, 150, 400])
+        self.activity()
+
+        def run():
+            self.device.fill(room)
+            self.device.run("tavrelctl", "stat", "fold")
+            done = self.device.run("tavrel", "-d")
+            if not self.over_limits():
+                self.device.run("tavrelctl", "tidy")
+            self.device.empty()
+            return done
+
+        self.disturbed_run(run)
+        self.fold()
+
+    def over_limits(self):
+        return self.excess_days(self.days_held()) or any(map(self.excess_logs,
+                                                             ("pending", "outbox")))
+
+    def corrupt_store(self):
+        self.fold()
+        # Values without a date, which memory may still have, would be dated by a wrong clock.
+        if self.clock.wrong:
+            return
+        self.model.stored.remove()
+        self.activity()
+        for ending in ("-wal", "-shm"):
+            self.device.path(STORE + ending).unlink(missing_ok=True)
+        size = self.device.path(STORE).stat().st_size
+        self.device.write(STORE, self.chance.randbytes(size))
+        self.model.corruptions += 1
+        self.fold()
+        self.check_new_store(self.model.stored)
+
+    def corrupt_preferences(self):
+        path = self.device.path(PREFERENCES) / f"{OWN}.plist"
+        if path.exists():
+            path.write_bytes(path.read_bytes()[:self.chance.randrange(60)])
+            self.model.own = {}
+
+    def junk(self):
+        for name in JUNK_FILES:
+            if self.device.path(name).exists():
+                self.device.write(name, self.chance.randbytes(100))
+
+    def foreign_segment(self):
+        name = f"run/tavrel/stat/{self.chance.randrange(10 ** 9)}.segment"
+        self.device.write(name, self.chance.randbytes(5000))
+        self.fold()
+        self.model.stored.take(self.clock.today, 0, "a", "com.norvane.brimhold.segments_refused", 1)
+        self.device.path(name).unlink()
+
+    def torn_record(self):
+        """The end of a record that a power cut has left."""
+        if self.records_of_today().exists():
+            with open(self.records_of_today(), "ab") as file:
+                file.write(b'{"time":"20')
+            self.memory_error()
+
+
+# Per thousand days.
+EVENTS = {
+    "deny": 10, "update_system": 14, "update_whitelist": 10, "spoil_whitelist": 8,
+    "tasking": 20, "clear_tasking": 5, "change_limits": 6, "spoil_limits": 5, "server_away": 15,
+    "erase": 6, "burst": 10, "clock_ahead": 10, "clock_behind": 6, "clock_in_1970": 6,
+    "killed_run": 50, "killed_fold": 30, "killed_recorder": 40, "full_disk": 25, "corrupt_store": 6,
+    "corrupt_preferences": 6, "junk": 10, "foreign_segment": 8, "torn_record": 10,
+}

@@ -1,0 +1,255 @@
+"""What a device must hold and report, computed from what was done to it and from docs/ alone."""
+
+import bisect
+import datetime
+import hashlib
+import math
+
+from device import SECONDS_PER_DAY
+
+OWN = "com.norvane.tallied.tavrel"
+LAST_RUN = "LastCrashLogSerializationDateInDaysSince1970"
+DA = "com.norvane.da"
+OTHER = "com.example.settings"  # a domain of another program
+CAPACITY = 32 << 30
+NAND_PERIOD = 7 * SECONDS_PER_DAY
+TRACKED = ("com.example.", "statsd.", "com.norvane.usage.samples", "com.norvane.tavrel.limits.",
+           "com.norvane.brimhold.", "com.norvane.lumenhall.DiskUsageUserTotalBlocks")
+
+
+def moment(second):
+    return datetime.datetime(1970, 1, 1) + datetime.timedelta(seconds=second)
+
+
+def date_text(day):
+    return moment(day * SECONDS_PER_DAY).strftime("%Y-%m-%d")
+
+
+def coarsened(value, options):
+    if width := options.get("bucket_interval"):
+        shifted = value + width // 2
+        value = shifted - int(math.fmod(shifted, width))
+    if "sig_fig" in options and value:
+        drop = math.ceil(math.log10(abs(value))) - options["sig_fig"]
+        if drop >= 1:
+            scaled = value / 10.0 ** drop
+            value = int(10.0 ** drop * math.copysign(math.floor(abs(scaled) + 0.5), scaled))
+    return value
+
+
+def histogram(values, intervals):
+    ends = ["-inf", *map(str, intervals), "inf"]
+    counts = [0] * (len(intervals) + 1)
+    for value in values:
+        counts[bisect.bisect_left(intervals, value)] += 1
+    return {f"({ends[i]}, {ends[i + 1]}{']' if i < len(intervals) else ')'}": count
+            for i, count in enumerate(counts) if count}
+
+
+def summary(values):
+    mean = math.fsum(values) / len(values)
+    return [min(values), max(values), mean, math.fsum((v - mean) ** 2 for v in values), len(values)]
+
+
+class Statistics:
+    """Scalars by day and key, and the seconds and values of series."""
+
+    def __init__(self):
+        self.scalars, self.series = {}, {}
+
+    def take(self, day, second, kind, key, value):
+        if kind == "r":
+            self.series.setdefault(day, {}).setdefault(key, []).append((second, value))
+            return
+        scalars = self.scalars.setdefault(day, {})
+        scalars[key] = value + (scalars.get(key, 0) if kind == "a" else 0)
+
+    def remove(self, days=None, prefix=""):
+        for table in (self.scalars, self.series):
+            for day in list(table):
+                if days is not None and day not in days:
+                    continue
+                table[day] = {k: v for k, v in table[day].items() if not k.startswith(prefix)}
+                if not table[day]:
+                    del table[day]
+
+    def lines(self):
+        """As `tavrelctl stat export` prints them."""
+        return [f"scalar\t{day}\t{key}\t{value}" for day, row in self.scalars.items()
+                for key, value in row.items()] + [
+                    f"value\t{day}\t{key}\t{second}\t{value:.17g}"
+                    for day, row in self.series.items() for key, values in row.items()
+                    for second, value in values]
+
+    def copy(self):
+        twin = Statistics()
+        twin.scalars = {day: dict(row) for day, row in self.scalars.items()}
+        twin.series = {day: {key: list(values) for key, values in row.items()}
+                       for day, row in self.series.items()}
+        return twin
+
+
+class Model:
+    def __init__(self):
+        self.stored, self.waiting = Statistics(), []
+        self.ever = Statistics()  # whatever became of it
+        self.whitelist, self.whitelist_bytes = None, b""
+        self.permitted, self.first_day = False, None
+        self.version = {}
+        self.own = {}                       # the daemon's preferences
+        self.domains = {DA: {}, OTHER: {}}  # what a tasking has set
+        self.scheduled = None
+        self.corruptions = 0
+        self.last_nand = None
+        self.events, self.records = [], {}  # memory errors that wait, and that are filed by day
+        self.fates = {}                     # what became of each day
+
+    # -- Recording -----------------------------------------------------------------------------
+
+    def record(self, clock, build_day, kind, key, value):
+        """The day is that of the clock or, when it is before the library was built, that which
+        the time since boot gives once the clock is set."""
+        dated = clock.today >= build_day
+        self.waiting.append((clock.now if dated else None, clock.uptime, kind, key, value))
+
+    def fold(self, clock, build_day):
+        left = []
+        for second, uptime, kind, key, value in self.waiting:
+            if second is None:
+                if clock.today < build_day:
+                    left.append((second, uptime, kind, key, value))
+                    continue
+                second = clock.now - (clock.uptime - uptime)
+            for statistics in (self.stored, self.ever):
+                statistics.take(*divmod(second, SECONDS_PER_DAY), kind, key, value)
+        self.waiting = left
+
+    # -- The daily run -------------------------------------------------------------------------
+
+    def covers(self, day):
+        return self.permitted and (self.first_day is None or day >= self.first_day)
+
+    def options(self, table, key):
+        """Of the whitelist; None when the key does not leave the device."""
+        found = None
+        for group, tables in self.whitelist.items():
+            if self.domains[DA].get(group) is False:
+                continue
+            if key in tables.get(f"{table}Keys", {}):
+                found = (len(key) + 1, tables[f"{table}Keys"][key])
+            for prefix, options in tables.get(f"{table}KeyPrefixes", {}).items():
+                if key.startswith(prefix) and (found is None or len(prefix) >= found[0]):
+                    found = (len(prefix), options)
+        return None if found is None else found[1]
+
+    def log(self, day, clock, metadata):
+        """The content of the day's log, or why there is none."""
+        if not self.covers(clock.today - 1):
+            return "not-permitted"
+        if self.whitelist is None:
+            return "no-whitelist"
+        scalars, distributions, histograms = {}, {}, {}
+        for key, value in self.stored.scalars.get(day, {}).items():
+            if (options := self.options("Scalar", key)) is not None:
+                scalars[key] = coarsened(value, options)
+        for key, values in self.stored.series.get(day, {}).items():
+            if (options := self.options("Distribution", key)) is None:
+                continue
+            numbers = [value for _, value in values]
+            distributions[key] = summary(numbers)
+            if "intervals" in options:
+                histograms[key] = histogram(numbers, options["intervals"])
+        if not scalars and not distributions:
+            return "nothing-to-report"
+        probes = {"com.norvane.zentrix.bhd.database.corruptions": self.corruptions,
+                  "com.norvane.usage.cur_boot_session_cpu_uptime": clock.uptime // 60}
+        for key, value in probes.items():
+            if (options := self.options("Scalar", key)) is not None:
+                scalars[key] = coarsened(value, options)
+        return {"BHCrashLogVersion": 1, "BHStartDate": moment(day * SECONDS_PER_DAY),
+                "BHLogCreationDate": moment(clock.now), "BHMetadata": metadata,
+                "BHScalars": scalars, "BHDistributions": distributions,
+                "BHDistributionsHistogram": histograms,
+                "BHTasking": self.own.get("TaskingPayload", []),
+                "BHTaskID": self.own.get("TaskingID", "(no tasking id)"),
+                "BHTaskDigest": self.own.get("TaskingDigest", "(no tasking digest)"),
+                "BHWhitelistDigest": hashlib.md5(self.whitelist_bytes).hexdigest()}
+
+    def version_text(self):
+        return "{ProductName} {ProductVersion} ({ProductBuildVersion})".format(**self.version)
+
+    def metadata(self, clock):
+        """Of a log that is filed now; notes the version of the system."""
+        found = {"LogType": "193", "LogName": "log-tallied", "OSVersion": self.version_text(),
+                 "Time": moment(clock.now)}
+        last = self.own.get("LastOSVersion")
+        if last != self.version_text():
+            found["Options"] = {"previous_os_version": last or "<unknown>"}
+            self.own["LastOSVersion"] = self.version_text()
+        return found
+
+    def gated(self, clock, build_day, metadata):
+        """What a daily run does: the line about days without a run, and the effects of the tasks;
+        None when the gate is shut."""
+        day = clock.today - 1
+        last = self.own.get(LAST_RUN)
+        if (last or 0) >= day:
+            if last and last > day:
+                self.fates.setdefault(day, "the clock was set back")
+            return None
+        line = None
+        if last is not None and 1 < day - last <= 3660:
+            passed = range(last + 1, day)
+            line = (f"1 day had no run and will not be reported: {passed[0]}" if len(passed) == 1
+                    else f"{len(passed)} days had no run and will not be reported: "
+                         f"{passed[0]} to {passed[-1]}")
+            for each in passed:
+                self.fates.setdefault(each, "no run")
+        effects = self.tasks(day, clock, build_day, metadata)
+        effects["line"] = line
+        self.own["LastLogOutcome"] = effects["outcome"]
+        self.own[LAST_RUN] = day
+        return effects
+
+    def tasks(self, day, clock, build_day, metadata):
+        self.fold(clock, build_day)
+        effects = {"day": day, "log": None, "metadata": None, "deletes": not self.permitted,
+                   "sends": False, "nand": None}
+        if not self.permitted:
+            self.first_day = None
+        log = self.log(day, clock, metadata)
+        effects["outcome"] = log if isinstance(log, str) else "filed"
+        if not isinstance(log, str):
+            effects["log"], effects["metadata"] = log, self.metadata(clock)
+            if self.options("Scalar", "com.norvane.zentrix.bhd.database.corruptions") is not None:
+                self.corruptions = 0
+        self.fates[day] = "reported" if effects["log"] or self.fates.get(day) == "reported" \
+            else effects["outcome"]
+        if self.last_nand is None or clock.now - self.last_nand >= NAND_PERIOD:
+            effects["nand"] = "pending" if self.covers(clock.today) else "withheld"
+            self.last_nand = clock.now
+        self.stored.take(clock.today, 0, "s", "com.norvane.lumenhall.DiskUsageUserTotalBlocks",
+                         CAPACITY >> 20)
+        if self.events:
+            self.records.setdefault(clock.today, []).extend(self.events)
+            self.events = []
+        self.track(clock, effects)
+        return effects
+
+    def track(self, clock, effects):
+        build = self.version["ProductBuildVersion"]
+        if self.own.get("LastOSUpdate", {}).get("version") != build:
+            self.own["LastOSUpdate"] = {"version": build, "day": clock.today}
+        if self.scheduled is None:
+            return
+        if (self.own.get("TaskingID"), self.own.get("TaskingOS")) != (
+                self.scheduled["TaskingID"], build):
+            if "TaskingID" in self.own:
+                for setting in self.own["TaskingPayload"]:
+                    self.domains[setting["Domain"]].pop(setting["Key"], None)
+            for setting in self.scheduled["TaskingPayload"]:
+                self.domains[setting["Domain"]][setting["Key"]] = setting["Value"]
+            self.own.update(self.scheduled, TaskingOS=build)
+        days = self.domains[DA].get("AggressiveSubmissionDays", 0)
+        effects["sends"] = (self.permitted and
+                            abs(clock.today - self.own["LastOSUpdate"]["day"]) < days)

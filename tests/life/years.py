@@ -1,0 +1,163 @@
+"""Lives through the days, accounts for each, and watches what grows."""
+
+import os
+
+from device import Fault, RECORDS, SECONDS_PER_DAY, STORE
+from life import expect
+from mishaps import EVENTS, Mishaps
+
+MOST = {  # of what is held at the end of a year; the limits of docs/limits.md
+    "store KiB": (12 + 2 + 1) << 10, "days": 94, "positions": 64, "logs": 600, "withheld": 8,
+    "records": 64, "aside KiB": 16 << 10, "run KiB": 16 << 10, "left over": 8, "disk KiB": 58 << 10}
+MEMORY = ["tavrel", "tavrelctl stat fold", "tavrelctl tidy", "recorder", "tavrel-statsd",
+          "stat collect"]  # the peaks of those that end, and what those have that live on
+FLAT = 1.1          # a last year may have so much more than the first
+FLAT_KIBIBYTES = 512
+WARM_UP = 60        # days until the programs that live on have seen what there is to see
+
+
+class Years(Mishaps):
+    history = {}  # what befell the device on each day
+
+    def live(self, days, is_memory_flat):
+        self.is_memory_flat = is_memory_flat
+        self.off, self.wrong = set(), set()
+        first = self.clock.true // SECONDS_PER_DAY
+        year, self.figures = 0, []
+        day = first
+        while day < first + days:
+            self.day(day)
+            lived = day + 1 - first
+            if self.chance.random() < 0.012:
+                hole = self.chance.choice([1, 2, 5, 20, 45, 130])
+                self.off.update(range(day + 1, min(day + 1 + hole, first + days)))
+                self.count("days off", hole)
+                day += hole
+            day += 1
+            if lived >= min(WARM_UP, days) and not self.figures:
+                self.figures.append(self.measure())
+            if lived % 30 == 0:
+                self.check_statistics()
+            if (day - first) // 365 > year or day >= first + days:
+                year = (day - first) // 365
+                self.end_of_year(year, day - first)
+        self.account(first, first + days)
+
+    def day(self, day):
+        chance = self.chance
+        today = [name for name, rate in EVENTS.items() if chance.random() < rate / 1000]
+        self.history[day] = today
+        moments = sorted(chance.sample(range(600, SECONDS_PER_DAY - 600, 7), 4))
+        runs_at, happens_at = chance.randrange(4), chance.randrange(4)
+        self.support_log()
+        for number, second in enumerate(moments):
+            self.clock.go_to(day * SECONDS_PER_DAY + second)
+            if self.repair_clock_at is not None and self.clock.true >= self.repair_clock_at:
+                self.repair_clock()
+            if self.clock.wrong:
+                self.wrong.add(day)
+            self.activity()
+            if number == happens_at:
+                for name in today:
+                    getattr(self, name)()
+                    self.count(f"event {name}")
+            if number == runs_at:
+                self.daily_run()
+            if chance.random() < 0.5:
+                self.fold()
+        if chance.random() < 0.3 and len(self.model.events) < 4:
+            self.memory_error()
+        if self.uploads and chance.random() < 0.4:
+            self.upload()
+        if not self.model.permitted and not self.clock.wrong and chance.random() < 0.05:
+            self.allow()
+        if self.spoiled and chance.random() < 0.4:
+            for repair in self.spoiled:
+                repair()
+            self.spoiled = ()
+        self.age_leftovers()
+
+    def support_log(self):
+        path = self.device.path("var/mobile/Library/Logs/NorvaneCare/support.log")
+        path.parent.mkdir(parents=True, exist_ok=True)
+        with open(path, "ab") as file:
+            file.write(b"a line\n")
+
+    def age_leftovers(self):
+        """The kernel dates files with the machine's clock: what a killed program left is a day
+        older each day."""
+        for path in self.device.path("var").rglob(".tavrel-*.tmp"):
+            status = path.stat()
+            os.utime(path, (status.st_atime, status.st_mtime - SECONDS_PER_DAY))
+
+    def lately(self, day):
+        """For a report: the day and those before it."""
+        return [(each, self.history.get(each)) for each in range(day - 6, day + 3)]
+
+    # -- What grows ---------------------------------------------------------------------------
+
+    def measure(self):
+        device = self.device
+        size = sum((path.stat().st_size + 4095) // 4096 * 4 for folder in ("var", "etc")
+                   for path in device.path(folder).rglob("*") if path.is_file())
+        logs = device.logs()
+        figures = {
+            "store KiB": sum(path.stat().st_size // 1024 for path in
+                             device.path(os.path.dirname(STORE)).glob("*.sqlitedb*")
+                             if ".corrupt-" not in path.name),
+            "days": len(self.days_held()),
+            "positions": device.rows("SELECT count(*) FROM segments")[0][0],
+            "logs": len(logs["pending"]) + len(logs["outbox"]), "withheld": len(logs["withheld"]),
+            "records": len(list(device.path(RECORDS).glob("*.jsonl"))),
+            "aside KiB": self.set_aside()[1],
+            "run KiB": sum(path.stat().st_size // 1024
+                           for path in device.path("run").rglob("*") if path.is_file()),
+            "left over": len(list(device.path("var").rglob(".tavrel-*.tmp"))), "disk KiB": size}
+        expect(len(list(device.path("var/mobile/Library/Logs/NorvaneCare").iterdir())) <= 6,
+               "the support log grows")
+        memory = {name: peak for name, peak in device.peaks.items() if name in MEMORY}
+        device.peaks.clear()
+        descriptors = {}
+        for name in device.residents:
+            memory[name], descriptors[name] = device.resident(name)
+        return figures, memory, descriptors
+
+    def end_of_year(self, year, days):
+        self.fold()
+        self.check_statistics()
+        figures, memory, descriptors = measured = self.measure()
+        self.figures.append(measured)
+        columns = {"year": year, "days lived": days, **figures,
+                   **{f"{name} KiB": memory.get(name, 0) for name in MEMORY},
+                   "descriptors": sum(descriptors.values())}
+        if len(self.figures) == 2:
+            print("| " + " | ".join(columns) + " |\n" + "|---" * len(columns) + "|")
+        print("| " + " | ".join(map(str, columns.values())) + " |", flush=True)
+        for name, most in MOST.items():
+            expect(figures[name] <= most, f"{figures[name]} {name} are more than {most}")
+        _, first_memory, first_descriptors = self.figures[0]
+        expect(descriptors == first_descriptors, f"descriptors: {first_descriptors}, {descriptors}")
+        for name, number in memory.items() if self.is_memory_flat else ():
+            most = first_memory[name] * FLAT + FLAT_KIBIBYTES
+            expect(number <= most, f"{name} had {first_memory[name]} KiB and has {number}")
+
+    # -- Each day -----------------------------------------------------------------------------
+
+    def account(self, first, end):
+        fates = {}
+        last = self.clock.true // SECONDS_PER_DAY
+        for day in range(first, end):
+            fate = self.model.fates.get(day)
+            if fate is None and day in self.off:
+                fate = "the device was off"
+            if fate is None and {day, day + 1} & self.wrong:
+                fate = "the clock was wrong then or when its run was due"
+            if fate is None and day >= last:
+                fate = "not over"
+            if fate is None:
+                raise Fault(f"nobody knows what became of day {day}: {self.lately(day)}")
+            fates[fate] = fates.get(fate, 0) + 1
+        print(f"{end - first} days: " + ", ".join(f"{number} {fate}" for fate, number in
+                                                 sorted(fates.items(), key=lambda item: -item[1])))
+        for name, number in sorted(self.counts.items()):
+            print(f"{number:9} {name}")
