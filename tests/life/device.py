@@ -11,6 +11,7 @@ import struct
 import subprocess
 import termios
 import time
+from xml.parsers.expat import ExpatError
 
 STORE = "var/mobile/Library/Brimhold/BHDataStore.sqlitedb"
 PREFERENCES = "var/mobile/Library/Preferences"
@@ -99,8 +100,8 @@ class Device:
     def preferences(self, domain):
         try:
             return plistlib.loads((self.path(PREFERENCES) / f"{domain}.plist").read_bytes())
-        except FileNotFoundError:
-            return {}
+        except (FileNotFoundError, ExpatError, plistlib.InvalidFileException):
+            return {}  # as the programs read a damaged file
 
     def logs(self):
         """The names of the logs in each folder."""
