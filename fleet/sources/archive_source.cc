@@ -102,7 +102,7 @@ bool isFile(archive_entry* entry) {
   return archive_entry_filetype(entry) == AE_IFREG && archive_entry_hardlink(entry) == nullptr;
 }
 
-using Sidecars = std::unordered_map<std::string, LogMetadata>;
+using Sidecars = std::unordered_map<std::string, Expected<LogMetadata>>;
 
 Sidecars readSidecars(const std::string& path) {
   Sidecars sidecars;
@@ -111,18 +111,23 @@ Sidecars readSidecars(const std::string& path) {
   while (archive_entry* const entry = archive.next()) {
     const std::string name(nameOf(entry));
     if (!isFile(entry) || !isMetadataName(name)) continue;
-    if (!archive.read(limits::kMetadataBytes, content)) continue;
-    if (auto metadata = readMetadataFile(asBytes(content))) {
-      sidecars.insert_or_assign(name, *std::move(metadata));
-    }
+    const bool isRead = archive.read(limits::kMetadataBytes, content);
+    if (!isRead && !archive.failure().empty()) break;
+    sidecars.insert_or_assign(
+        name, isRead ? readMetadataFile(asBytes(content))
+                     : Expected<LogMetadata>(
+                           Error{format("has more than %zu bytes", limits::kMetadataBytes)}));
   }
   return sidecars;
 }
 
-std::optional<LogMetadata> metadataOf(const std::string& name, const Sidecars& sidecars,
-                                      const UploadLines& lines) {
+Expected<std::optional<LogMetadata>> metadataOf(const std::string& name, const Sidecars& sidecars,
+                                                const UploadLines& lines) {
   const auto sidecar = sidecars.find(sidecarOf(name));
-  if (sidecar != sidecars.end()) return sidecar->second;
+  if (sidecar != sidecars.end()) {
+    if (!sidecar->second) return sidecar->second.error();
+    return std::optional(*sidecar->second);
+  }
   const LogMetadata* const line = lines.find(folderNameOf(name), withoutGzip(fileNameOf(name)));
   return line != nullptr ? std::optional(*line) : std::nullopt;
 }
@@ -143,11 +148,13 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
       sink(std::move(item));
       continue;
     }
-    item.metadata = metadataOf(name, sidecars, lines);
+    const auto metadata = metadataOf(name, sidecars, lines);
+    if (metadata) item.metadata = *metadata;
     if (isOtherLog(withoutGzip(fileNameOf(name)), item.metadata ? &*item.metadata : nullptr)) {
       item.kind = Kind::kOther;
     } else if (archive.read(limits::kLogBytes, item.content)) {
-      item.kind = Kind::kContent;
+      item.kind = metadata ? Kind::kContent : Kind::kRefused;
+      if (!metadata) item.reason = "its metadata: " + metadata.error().message;
     } else if (archive.failure().empty()) {
       item.kind = Kind::kRefused;
       item.content.clear();

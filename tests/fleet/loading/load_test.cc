@@ -156,6 +156,8 @@ TEST_F(LoadTest, TakesArchives) {
   write("in/d/a.metadata.plist", kMetadata);
   write("in/d/b.log.gz", gzipped(sampleLog(2)));
   write("in/d/c.log", sampleLog(3).substr(0, 500));
+  write("in/d/e.log", sampleLog(4));
+  write("in/d/e.metadata.plist", "<plist>");
   std::filesystem::create_symlink("a.log", at("in/d/link.log"));
   const std::string pack = format(
       "cd %s && tar -cf all.tar -C in d && tar -czf all.tgz -C in d && "
@@ -163,8 +165,9 @@ TEST_F(LoadTest, TakesArchives) {
       at(""));
   ASSERT_EQ(std::system(pack.c_str()), 0);
   const Outcome outcome = run({at("all.tar")});
-  EXPECT_EQ(outcome.out, "2 loaded, 0 known, 1 refused\n");
+  EXPECT_EQ(outcome.out, "2 loaded, 0 known, 2 refused\n");
   EXPECT_EQ(outcome.status, 1);
+  EXPECT_NE(outcome.error.find("refused: all.tar: d/e.log: its metadata: "), std::string::npos);
   EXPECT_NE(outcome.error.find("skipped: all.tar: d/link.log: is not a regular file\n"),
             std::string::npos);
   EXPECT_NE(outcome.error.find("refused: all.tar: d/c.log: is cut short: the property list does "
@@ -172,7 +175,7 @@ TEST_F(LoadTest, TakesArchives) {
             std::string::npos);
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
-  EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 1 refused\n");
+  EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 2 refused\n");
   const Outcome cut = run({at("cut.tar")});
   EXPECT_NE(cut.error.find("refused: cut.tar: the rest cannot be read: "), std::string::npos)
       << cut.error;
