@@ -13,8 +13,8 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
-#include "tools/completion/completion_script.h"
 #include "tools/completion/man_page.h"
+#include "tools/completion/scripts/completion_script.h"
 #include "tools/stat/recorded.h"
 
 namespace tavrel {
@@ -90,6 +90,14 @@ void printManPage(ToolContext& context, const std::string& file, const Command& 
   context.out() << *page;
 }
 
+CompletedProgram completedProgram(const Command& program) {
+  return {.model = modelOf(program),
+          .anywhere = "--root",
+          .lists = {{"DAY", "days"}, {"KEY", "keys"}, {"PREFIX", "keys"}, {"DOMAIN", "domains"}},
+          // Keys of preferences are not those of statistics.
+          .exceptions = {{"prefs", "KEY", "none"}, {"log show", "FILE", "logs"}}};
+}
+
 }  // namespace
 
 void addCompletionCommand(Command program, ToolContext& context) {
@@ -112,10 +120,10 @@ void addCompletionCommand(Command program, ToolContext& context) {
     if (what == "domains") return listDomains(context);
     if (what == "logs") return listLogs(context);
     if (what == "man") return printManPage(context, arguments->file, program);
-    const CommandModel model = modelOf(program);
-    context.out() << (what == "bash"  ? bashScript(model)
-                      : what == "zsh" ? zshScript(model)
-                                      : fishScript(model));
+    const CompletedProgram completed = completedProgram(program);
+    context.out() << (what == "bash"  ? bashScript(completed)
+                      : what == "zsh" ? zshScript(completed)
+                                      : fishScript(completed));
   });
 }
 

@@ -1,15 +1,15 @@
-#include "tools/completion/completion_script.h"
+#include "tools/completion/scripts/completion_script.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kBegin = R"(# bash completion for tavrelctl. Generated: do not edit.
+constexpr std::string_view kBegin = R"(# bash completion for @program@. Generated: do not edit.
 
 )";
 
 // Names from the device are compared and never expanded: whoever records chooses them.
 constexpr std::string_view kEnd = R"(
-_tavrelctl_complete() {
+_@id@_complete() {
   local kind=$1 value
   case $kind in
     none) ;;
@@ -19,59 +19,60 @@ _tavrelctl_complete() {
     *)
       while IFS= read -r value; do
         [[ $value == "$cur"* ]] && COMPREPLY+=("$value")
-      done < <(tavrelctl "${root[@]}" completion "$kind" 2>/dev/null)
+      done < <(@program@ "${anywhere[@]}" completion "$kind" 2>/dev/null)
       [[ $kind == logs && $cur == */* ]] && mapfile -t COMPREPLY < <(compgen -f -- "$cur")
       ;;
   esac
 }
 
-_tavrelctl() {
+_@id@() {
   # Of --option=value, bash makes three words.
   local cur=${COMP_WORDS[COMP_CWORD]#=} path='' given=0 wanted='' word i
-  local -a root=() commands options arguments
+  local -a anywhere=() commands options arguments
   local -A values
   local repeats=0
   COMPREPLY=()
-  _tavrelctl_of ''
+  _@id@_of ''
   for ((i = 1; i < COMP_CWORD; i++)); do
     word=${COMP_WORDS[i]}
     [[ $word == = ]] && continue
     if [[ -n $wanted ]]; then
-      [[ $wanted == --root ]] && root=(--root "$word")
+      [[ $wanted == @anywhere@ ]] && anywhere=(@anywhere@ "$word")
       wanted=''
-    elif [[ $word == --root || ( $word == -* && -n ${values[$word]} ) ]]; then
+    elif [[ $word == @anywhere@ || ( $word == -* && -n ${values[$word]} ) ]]; then
       wanted=$word
     elif [[ $word != -* && " ${commands[*]} " == *" $word "* ]]; then
       path+=${path:+ }$word
-      _tavrelctl_of "$path"
+      _@id@_of "$path"
     elif [[ $word != -* ]]; then
       ((given++))
     fi
   done
-  if [[ $wanted == --root ]]; then
-    _tavrelctl_complete folders
+  if [[ $wanted == @anywhere@ ]]; then
+    _@id@_complete @kind@
   elif [[ -n $wanted ]]; then
-    _tavrelctl_complete "${values[$wanted]}"
+    _@id@_complete "${values[$wanted]}"
   elif [[ $cur == -* ]]; then
-    mapfile -t COMPREPLY < <(compgen -W "${options[*]} --root --help" -- "$cur")
+    mapfile -t COMPREPLY < <(compgen -W "${options[*]} @anywhere@ --help" -- "$cur")
   elif ((${#commands[@]})); then
     mapfile -t COMPREPLY < <(compgen -W "${commands[*]}" -- "$cur")
   elif ((${#arguments[@]})); then
     # The last argument may be the one that repeats.
     ((given < ${#arguments[@]})) || { ((repeats)) && given=$((${#arguments[@]} - 1)); }
-    ((given < ${#arguments[@]})) && _tavrelctl_complete "${arguments[given]}"
+    ((given < ${#arguments[@]})) && _@id@_complete "${arguments[given]}"
   fi
 }
 
-complete -F _tavrelctl tavrelctl
+complete -F _@id@ @program@
 )";
 
-std::string kindOf(const CommandModel& command, const OptionModel& option) {
+std::string kindOf(const CompletedProgram& program, const CommandModel& command,
+                   const OptionModel& option) {
   if (!option.choices.empty()) return shellQuoted("words:" + joined(option.choices));
-  return std::string(valueKind(command, option));
+  return std::string(program.valueKind(command, option));
 }
 
-void addCase(const CommandModel& command, std::string& script) {
+void addCase(const CompletedProgram& program, const CommandModel& command, std::string& script) {
   std::vector<std::string> commands, options, values, arguments;
   for (const CommandModel& below : command.commands)
     commands.push_back(below.name);
@@ -79,11 +80,11 @@ void addCase(const CommandModel& command, std::string& script) {
   for (const OptionModel& option : command.options) {
     for (const std::string& name : option.names) {
       options.push_back(name);
-      if (!option.isFlag()) values.push_back("[" + name + "]=" + kindOf(command, option));
+      if (!option.isFlag()) values.push_back("[" + name + "]=" + kindOf(program, command, option));
     }
   }
   for (const OptionModel& argument : command.arguments) {
-    arguments.push_back(kindOf(command, argument));
+    arguments.push_back(kindOf(program, command, argument));
     repeats = argument.mayRepeat;
   }
   script += "    " + shellQuoted(command.path) + ")\n";
@@ -94,13 +95,14 @@ void addCase(const CommandModel& command, std::string& script) {
 
 }  // namespace
 
-std::string bashScript(const CommandModel& program) {
+std::string bashScript(const CompletedProgram& program) {
   std::string script(kBegin);
-  script += "_tavrelctl_of() {\n  case $1 in\n";
-  walk(program, [&](const CommandModel& command) { addCase(command, script); });
+  script += "_@id@_of() {\n  case $1 in\n";
+  walk(program.model, [&](const CommandModel& command) { addCase(program, command, script); });
   script += "  esac\n}\n";
   script += kEnd;
-  return script;
+  script.replace(script.find("@kind@"), 6, program.valueKind({}, program.anywhereOption()));
+  return filledIn(script, program);
 }
 
 }  // namespace tavrel

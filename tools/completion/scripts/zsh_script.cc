@@ -1,23 +1,23 @@
 #include <algorithm>
 
-#include "tools/completion/completion_script.h"
+#include "tools/completion/scripts/completion_script.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kBegin = R"zsh(#compdef tavrelctl
-# zsh completion for tavrelctl. Generated: do not edit.
+constexpr std::string_view kBegin = R"zsh(#compdef @program@
+# zsh completion for @program@. Generated: do not edit.
 
-_tavrelctl_list() {
+_@id@_list() {
   local -a found
-  found=(${(f)"$(_call_program values tavrelctl completion $1 2>/dev/null)"})
+  found=(${(f)"$(_call_program values @program@ completion $1 2>/dev/null)"})
   compadd -a found
 }
 
 )zsh";
 
 std::string functionName(const CommandModel& command) {
-  std::string name = command.path.empty() ? "_tavrelctl" : "_tavrelctl " + command.path;
+  std::string name = command.path.empty() ? "_@id@" : "_@id@ " + command.path;
   std::replace(name.begin(), name.end(), ' ', '_');
   return name;
 }
@@ -33,40 +33,42 @@ std::string plain(std::string_view text) {
   return result;
 }
 
-std::string valueText(const CommandModel& command, const OptionModel& option) {
+std::string valueText(const CompletedProgram& program, const CommandModel& command,
+                      const OptionModel& option) {
   std::string text = ":" + plain(option.value) + ":";
   if (!option.choices.empty()) return text + "(" + joined(option.choices) + ")";
-  const std::string_view kind = valueKind(command, option);
+  const std::string_view kind = program.valueKind(command, option);
   if (kind == "none") return text;
   if (kind == "files") return text + "_files";
   if (kind == "folders") return text + "_files -/";
-  return text + "{_tavrelctl_list " + std::string(kind) + "}";
+  return text + "{_@id@_list " + std::string(kind) + "}";
 }
 
-std::string argumentOf(const CommandModel& command, const OptionModel& option,
-                       const std::string& name) {
+std::string argumentOf(const CompletedProgram& program, const CommandModel& command,
+                       const OptionModel& option, const std::string& name) {
   std::string text = "(" + joined(option.names);
   for (const std::string& other : option.excludes)
     text += ' ' + other;
   // "=" allows --name=VALUE beside --name VALUE.
   const bool allowsBoth = !option.isFlag() && name.starts_with("--");
   text += ")" + name + (allowsBoth ? "=" : "") + "[" + plain(option.description) + "]";
-  return shellQuoted(option.isFlag() ? text : text + valueText(command, option));
+  return shellQuoted(option.isFlag() ? text : text + valueText(program, command, option));
 }
 
-void addArguments(const CommandModel& command, std::string& script) {
+void addArguments(const CompletedProgram& program, const CommandModel& command,
+                  std::string& script) {
   for (const OptionModel& option : command.options) {
     for (const std::string& name : option.names)
-      script += " \\\n    " + argumentOf(command, option, name);
+      script += " \\\n    " + argumentOf(program, command, option, name);
   }
 }
 
-void addGroup(const CommandModel& command, std::string& script) {
+void addGroup(const CompletedProgram& program, const CommandModel& command, std::string& script) {
   script += "  local context state line\n  local -a commands=(\n";
   for (const CommandModel& below : command.commands)
     script += "    " + shellQuoted(below.name + ":" + plain(below.description)) + '\n';
-  script += "  )\n  _arguments -C $root";
-  addArguments(command, script);
+  script += "  )\n  _arguments -C $anywhere";
+  addArguments(program, command, script);
   script += " \\\n    '1:command:->command' '*::argument:->argument'\n  case $state in\n";
   script += "    command) _describe -t commands command commands ;;\n";
   script += "    argument)\n      case $words[1] in\n";
@@ -75,20 +77,21 @@ void addGroup(const CommandModel& command, std::string& script) {
   script += "      esac ;;\n  esac\n";
 }
 
-void addFunction(const CommandModel& command, std::string& script) {
+void addFunction(const CompletedProgram& program, const CommandModel& command,
+                 std::string& script) {
   for (const CommandModel& below : command.commands)
-    addFunction(below, script);
+    addFunction(program, below, script);
   script += functionName(command) + "() {\n";
-  script +=
-      "  local -a root=('--root=[Folder of the device]:DIR:_files -/' '--help[Show how it is "
-      "used]')\n";
+  script += "  local -a anywhere=(" +
+             argumentOf(program, {}, program.anywhereOption(), program.anywhere) +
+             " '--help[Show how it is used]')\n";
   if (!command.commands.empty()) {
-    addGroup(command, script);
+    addGroup(program, command, script);
   } else {
-    script += "  _arguments $root";
-    addArguments(command, script);
+    script += "  _arguments $anywhere";
+    addArguments(program, command, script);
     for (const OptionModel& argument : command.arguments) {
-      const std::string text = valueText(command, argument);
+      const std::string text = valueText(program, command, argument);
       script += " \\\n    " + shellQuoted((argument.mayRepeat ? "*" : "") + text);
     }
     script += '\n';
@@ -98,13 +101,14 @@ void addFunction(const CommandModel& command, std::string& script) {
 
 }  // namespace
 
-std::string zshScript(const CommandModel& program) {
+std::string zshScript(const CompletedProgram& program) {
+  CommandModel model = program.model;
+  // Each function offers this one itself.
+  std::erase_if(model.options,
+                [&](const OptionModel& option) { return option.name() == program.anywhere; });
   std::string script(kBegin);
-  CommandModel model = program;
-  // Each function offers --root itself.
-  std::erase_if(model.options, [](const OptionModel& option) { return option.name() == "--root"; });
-  addFunction(model, script);
-  return script + "_tavrelctl \"$@\"\n";
+  addFunction(program, model, script);
+  return filledIn(script + "_@id@ \"$@\"\n", program);
 }
 
 }  // namespace tavrel
