@@ -1,9 +1,9 @@
-# Completions and manual pages that the built tool makes of its own commands:
+# Completions and manual pages that the built tools make of their own commands:
 #
-#   BUILD/completions/bash/tavrelctl, zsh/_tavrelctl, fish/tavrelctl.fish
+#   BUILD/completions/bash/PROGRAM, zsh/_PROGRAM, fish/PROGRAM.fish of tavrelctl and tavrel-fleet
 #   BUILD/man/tavrelctl.1
 #
-# A cross build needs CMAKE_CROSSCOMPILING_EMULATOR to run the tool, and has none of them without.
+# A cross build needs CMAKE_CROSSCOMPILING_EMULATOR to run the tools, and has none of them without.
 if(CMAKE_CROSSCOMPILING AND NOT CMAKE_CROSSCOMPILING_EMULATOR)
   message(WARNING "No completions and no tavrelctl(1): set CMAKE_CROSSCOMPILING_EMULATOR")
   return()
@@ -11,26 +11,28 @@ endif()
 
 set(tavrel_generated_documents)
 
-# What `tavrelctl completion ARGUMENTS` prints, in a file of the build folder.
-function(tavrel_generated_document file)
+# What `PROGRAM completion ARGUMENTS` prints, in a file of the build folder.
+function(tavrel_generated_document file program)
   cmake_parse_arguments(ARG "" "" "ARGUMENTS;DEPENDS" ${ARGN})
   set(path ${PROJECT_BINARY_DIR}/${file})
   get_filename_component(folder ${path} DIRECTORY)
   file(MAKE_DIRECTORY ${folder})
   add_custom_command(
     OUTPUT ${path}
-    COMMAND tavrelctl completion ${ARG_ARGUMENTS} > ${path}.new
+    COMMAND ${program} completion ${ARG_ARGUMENTS} > ${path}.new
     COMMAND ${CMAKE_COMMAND} -E rename ${path}.new ${path}
-    DEPENDS tavrelctl ${ARG_DEPENDS}
+    DEPENDS ${program} ${ARG_DEPENDS}
     COMMENT "Generating ${file}"
     VERBATIM)
   set(tavrel_generated_documents ${tavrel_generated_documents} ${path} PARENT_SCOPE)
 endfunction()
 
-tavrel_generated_document(completions/bash/tavrelctl ARGUMENTS bash)
-tavrel_generated_document(completions/zsh/_tavrelctl ARGUMENTS zsh)
-tavrel_generated_document(completions/fish/tavrelctl.fish ARGUMENTS fish)
+foreach(program tavrelctl tavrel-fleet)
+  tavrel_generated_document(completions/bash/${program} ${program} ARGUMENTS bash)
+  tavrel_generated_document(completions/zsh/_${program} ${program} ARGUMENTS zsh)
+  tavrel_generated_document(completions/fish/${program}.fish ${program} ARGUMENTS fish)
+endforeach()
 set(template ${PROJECT_SOURCE_DIR}/packaging/man/tavrelctl.1.in)
-tavrel_generated_document(man/tavrelctl.1 ARGUMENTS man ${template} DEPENDS ${template})
+tavrel_generated_document(man/tavrelctl.1 tavrelctl ARGUMENTS man ${template} DEPENDS ${template})
 
 add_custom_target(tavrel_documents ALL DEPENDS ${tavrel_generated_documents})

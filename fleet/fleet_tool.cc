@@ -5,6 +5,7 @@
 
 #include "base/version.h"
 #include "fleet/commands/compare_command.h"
+#include "fleet/commands/completion_command.h"
 #include "fleet/commands/load_command.h"
 #include "fleet/commands/page_command.h"
 #include "fleet/commands/show_command.h"
@@ -16,7 +17,8 @@ namespace {
 
 // In the order of the help.
 constexpr void (*kSubcommands[])(Command top, FleetContext& context) = {
-    addLoadCommand, addSummaryCommand, addShowCommand, addCompareCommand, addPageCommand};
+    addLoadCommand,    addSummaryCommand, addShowCommand,
+    addCompareCommand, addPageCommand,    addCompletionCommand};
 
 void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) {
   app.fallthrough();
@@ -24,10 +26,10 @@ void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) 
   app.footer("--database may appear anywhere on the line. See tavrel-fleet(1).");
   app.set_version_flag("--version", "tavrel-fleet " + std::string(version()));
   top.addOption("--database", context.database(),
-                "File of the tables, or clickhouse://HOST:PORT/NAME")
+                "File of the tables, or clickhouse[s]://HOST[:PORT]/NAME[?cluster=NAME]")
       .typeName("FILE")
       .showDefault()
-      .check([](const std::string& where) { return where.empty() ? "names no file" : ""; });
+      .check(databaseFault);
 }
 
 }  // namespace

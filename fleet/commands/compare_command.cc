@@ -1,5 +1,6 @@
 #include "fleet/commands/compare_command.h"
 
+#include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -53,27 +54,37 @@ std::string leftOutText(const CompareAnswer& answer) {
   add(answer.missing, "without logs of both versions on these days");
   add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
                          " devices, or close to a set that was shown");
-  add(answer.unfit, "with values that are no finite numbers");
+  add(answer.unfit, "without a finite mean in one version");
   return text.empty() ? text : "Left out:\n" + text;
 }
 
 void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
   std::size_t changed = 0;
+  const auto withoutMean = [](const Comparison& one) {
+    return one.before.logsWithoutMean + one.after.logsWithoutMean;
+  };
+  const bool areLeftOut = std::ranges::any_of(answer.comparisons, [&](const Comparison& one) {
+    return (one.isReal() || all) && withoutMean(one) != 0;
+  });
   using Align = Table::Align;
-  Table table({{"KEY"},
-               {"BEFORE", Align::Right},
-               {"AFTER", Align::Right},
-               {"CHANGE", Align::Right},
-               {"RELATIVE", Align::Right},
-               {"95 % INTERVAL"},
-               {"UNIT"},
-               {"EFFECT", Align::Right},
-               {"CHANCE", Align::Right}});
+  std::vector<Table::Column> columns = {{"KEY", Align::Whole},
+                                        {"KIND", Align::Whole},
+                                        {"BEFORE", Align::Right, 1},
+                                        {"AFTER", Align::Right},
+                                        {"CHANGE", Align::Right, 5},
+                                        {"RELATIVE", Align::Right},
+                                        {"95 % INTERVAL", Align::Whole, 6},
+                                        {"UNIT", Align::Whole, 4},
+                                        {"EFFECT", Align::Right, 3},
+                                        {"CHANCE", Align::Right, 2}};
+  if (areLeftOut) columns.push_back({"NO MEAN", Align::Right});
+  Table table(std::move(columns));
   for (const Comparison& one : answer.comparisons) {
     if (one.isReal()) ++changed;
     if (!one.isReal() && !all) continue;
     table.add(
         {{one.key.name, one.isReal() ? Emphasis::Strong : Emphasis::None},
+         kindName(one),
          shortNumber(one.before.mean),
          shortNumber(one.after.mean),
          signedText(one.difference),
@@ -81,7 +92,8 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
          signedText(one.difference - one.margin) + " to " + signedText(one.difference + one.margin),
          unitOf(one.key.name),
          one.effect ? signedText(std::round(*one.effect * 100) / 100) : "constant",
-         probabilityText(one.corrected)});
+         probabilityText(one.corrected),
+         withoutMean(one) == 0 ? "" : std::to_string(withoutMean(one))});
   }
   std::ostream& out = context.out();
   out << printable(answer.request.oldVersion) << " -> " << printable(answer.request.newVersion)
@@ -91,6 +103,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
     out << "\n";
     table.print(context.page());
   }
+  if (areLeftOut) out << "\n" << noMeanText() << "\n";
   const std::string leftOut = leftOutText(answer);
   if (!leftOut.empty()) out << "\n" << leftOut;
 }
@@ -98,6 +111,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
 Json sideJson(const ComparedSide& side) {
   return {{"devices", side.devices},
           {"logs", side.logs},
+          {"logs_without_mean", side.logsWithoutMean},
           {"mean", realJson(side.mean)},
           {"standard_deviation", side.deviation ? realJson(*side.deviation) : Json(nullptr)}};
 }
@@ -128,17 +142,32 @@ Json compareJson(const CompareAnswer& answer) {
           {"left_out",
            {{"not_in_both", answer.missing},
             {"too_few_devices", answer.tooFew},
-            {"not_finite", answer.unfit}}}};
+            {"no_mean", answer.unfit}}}};
 }
 
 void printCsv(std::ostream& out, const CompareAnswer& answer) {
   CsvWriter csv(out);
-  for (const char* title : {"key", "kind", "unit", "changed", "devices_before", "devices_after",
-                            "mean_before", "mean_after", "difference", "lower", "upper", "relative",
-                            "effect", "probability", "corrected_probability"}) {
-    csv.title(title);
-  }
-  csv.endRow();
+  csv.titles({"key",
+              "kind",
+              "unit",
+              "changed",
+              "devices_before",
+              "devices_after",
+              "logs_before",
+              "logs_after",
+              "logs_without_mean_before",
+              "logs_without_mean_after",
+              "mean_before",
+              "mean_after",
+              "standard_deviation_before",
+              "standard_deviation_after",
+              "difference",
+              "lower",
+              "upper",
+              "relative",
+              "effect",
+              "probability",
+              "corrected_probability"});
   const auto optional = [&](std::optional<double> value) {
     value ? csv.real(*value) : csv.nothing();
   };
@@ -146,8 +175,12 @@ void printCsv(std::ostream& out, const CompareAnswer& answer) {
     csv.text(one.key.name).title(kindName(one)).title(unitOf(one.key.name));
     csv.title(one.isReal() ? "true" : "false");
     csv.integer(one.before.devices).integer(one.after.devices);
-    csv.real(one.before.mean).real(one.after.mean).real(one.difference);
-    csv.real(one.difference - one.margin).real(one.difference + one.margin);
+    csv.integer(one.before.logs).integer(one.after.logs);
+    csv.integer(one.before.logsWithoutMean).integer(one.after.logsWithoutMean);
+    csv.real(one.before.mean).real(one.after.mean);
+    optional(one.before.deviation);
+    optional(one.after.deviation);
+    csv.real(one.difference).real(one.difference - one.margin).real(one.difference + one.margin);
     optional(one.relative);
     optional(one.effect);
     csv.real(one.probability).real(one.corrected).endRow();
@@ -161,9 +194,9 @@ void addCompareCommand(Command top, FleetContext& context) {
       top.addCommand("compare", "Find the statistics that changed between two OS versions");
   auto options = std::make_shared<CompareOptions>();
   command.addOption("OLD", options->before, "The version before, or a part of its name")
-      .typeName("VERSION")
+      .typeName("")
       .required();
-  command.addOption("NEW", options->after, "The version after").typeName("VERSION").required();
+  command.addOption("NEW", options->after, "The version after").typeName("").required();
   addQuestionOptions(command, *options);
   addFormOptions(command, context, *options);
   command.addFlag("--all", options->all, "Also list the statistics that did not change");

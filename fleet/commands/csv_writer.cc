@@ -64,4 +64,10 @@ void CsvWriter::endRow() {
   isFirst_ = true;
 }
 
+void CsvWriter::titles(std::initializer_list<std::string_view> columns) {
+  for (const std::string_view column : columns)
+    title(column);
+  endRow();
+}
+
 }  // namespace tavrel::fleet

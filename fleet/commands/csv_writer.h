@@ -2,6 +2,7 @@
 #pragma once
 
 #include <cstdint>
+#include <initializer_list>
 #include <iosfwd>
 #include <string_view>
 
@@ -21,6 +22,8 @@ class CsvWriter {
   CsvWriter& integer(std::uint64_t value);
   CsvWriter& nothing();
   void endRow();
+  /// The first row.
+  void titles(std::initializer_list<std::string_view> columns);
 
  private:
   void separate();

@@ -74,7 +74,7 @@ void addLoadCommand(Command top, FleetContext& context) {
   const Command command = top.addCommand("load", "File logs in the tables");
   auto options = std::make_shared<LoadOptions>();
   command.addOption("PATH", options->request.paths, "Logs, folders with logs, tar archives")
-      .typeName("FILE")
+      .typeName("")
       .required();
   command
       .addOption("--metadata", options->request.uploadLines,

@@ -7,6 +7,7 @@
 #include "base/civil_time.h"
 #include "fleet/questions/day_range.h"
 #include "tools/shared/table.h"
+#include "tools/shared/value_text.h"
 
 namespace tavrel::fleet {
 
@@ -123,8 +124,35 @@ std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAt
   if (joined == 0) return "";
   const std::string why = "groups of fewer than " + std::to_string(devicesAtLeast) + " devices";
   if (!hasGroups) return "Not divided: the parts would tell of " + why + ".";
-  return std::string(kOtherTitle) + " joins " + std::to_string(joined) +
+  return PartName{PartKind::kOther}.text() + " joins " + std::to_string(joined) +
          " groups, so that nothing tells of " + why + ".";
+}
+
+std::string noMeanText() {
+  return "NO MEAN counts logs that means and deviations leave out: some of their values are not "
+         "finite, or too far apart.";
+}
+
+const char* kindText(const PartName& name) {
+  switch (name.kind) {
+    case PartKind::kWhole:
+      return "all";
+    case PartKind::kNotTold:
+      return "not_told";
+    case PartKind::kOther:
+      return "other";
+    case PartKind::kValue:
+      break;
+  }
+  return "value";
+}
+
+Json partJson(const PartName& name) {
+  return {{"part", kindText(name)}, {"group", name.isValue() ? Json(name.value) : Json(nullptr)}};
+}
+
+std::string figureText(double value) {
+  return std::isnan(value) ? "-" : shortNumber(value);
 }
 
 Json realJson(double value) {

@@ -64,6 +64,16 @@ std::string tooFewText(std::size_t devicesAtLeast);
 /// A sentence on groups that are shown as one; empty without.
 std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAtLeast);
 
+/// What a column of counts of logs without a mean says.
+std::string noMeanText();
+
+/// What stands for a part in JSON and CSV: "all", "value", "not_told" or "other".
+const char* kindText(const PartName& name);
+/// The members "part" and "group", which is null but for values.
+Json partJson(const PartName& name);
+/// A number for people: "-" for what is not told.
+std::string figureText(double value);
+
 /// A number for JSON: what is not finite is null there.
 Json realJson(double value);
 /// {"first": "2026-11-01", "last": "2026-11-07"}, with null for an open end.

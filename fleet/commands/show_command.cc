@@ -13,6 +13,7 @@ struct ShowOptions : QuestionOptions {
   std::string key;
   std::string by = "none";
   std::string against;  // empty without one
+  bool buckets = false;
 };
 
 GroupBy groupBy(const std::string& name) {
@@ -64,7 +65,7 @@ std::vector<ShowAnswer> answers(Question& question, const ShowOptions& options) 
 void addShowCommand(Command top, FleetContext& context) {
   const Command command = top.addCommand("show", "Show how one statistic is distributed");
   auto options = std::make_shared<ShowOptions>();
-  command.addOption("KEY", options->key, "The statistic").typeName("KEY").required();
+  command.addOption("KEY", options->key, "The statistic").typeName("").required();
   command.addOption("--by", options->by, "Divide the devices")
       .typeName("WHAT")
       .oneOf({"none", "os", "region", "day", "digest"})
@@ -75,10 +76,17 @@ void addShowCommand(Command top, FleetContext& context) {
       .typeName("DAYS|VERSION");
   addQuestionOptions(command, *options);
   addFormOptions(command, context, *options);
+  command
+      .addFlag("--buckets", options->buckets,
+               "Print the histograms of all parts instead of their figures")
+      .excludes("--json");
   command.onRun([&context, options] {
     ask(context, *options, [&](Question& question) {
       const std::vector<ShowAnswer> shown = answers(question, *options);
-      if (options->csv) return printShownCsv(context.out(), shown);
+      if (options->csv) {
+        return options->buckets ? printBucketsCsv(context.out(), shown)
+                                : printShownCsv(context.out(), shown);
+      }
       if (context.json()) {
         Json list = Json::array();
         for (const ShowAnswer& answer : shown)
@@ -89,7 +97,7 @@ void addShowCommand(Command top, FleetContext& context) {
       }
       for (const ShowAnswer& answer : shown) {
         if (&answer != &shown.front()) context.out() << "\n";
-        printShown(context, answer);
+        printShown(context, answer, options->buckets);
       }
     });
   });

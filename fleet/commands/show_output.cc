@@ -23,20 +23,26 @@ struct Figures {
   double maximum = 0;
   double mean = 0;
   double squaredDeviations = 0;
+  std::optional<double> deviation;
+  std::size_t logsWithoutMean = 0;
 };
 
 Figures figuresOf(const ShownSet& set) {
   if (set.scalar) {
-    return {set.logs, static_cast<double>(set.scalar->minimum),
-            static_cast<double>(set.scalar->maximum), set.scalar->mean,
-            set.scalar->squaredDeviations};
+    const ScalarSpread& spread = *set.scalar;
+    return {set.logs,
+            static_cast<double>(spread.minimum),
+            static_cast<double>(spread.maximum),
+            spread.mean,
+            spread.squaredDeviations,
+            standardDeviation(spread.squaredDeviations, set.logs),
+            0};
   }
-  const FiveNumbers numbers = set.merged.value_or(FiveNumbers{});
-  return {numbers.count, numbers.minimum, numbers.maximum, numbers.mean, numbers.squaredDeviations};
-}
-
-std::optional<double> deviationOf(const Figures& figures) {
-  return standardDeviation({0, 0, 0, figures.squaredDeviations, figures.values});
+  const MergedAnswer merged = set.merged.value_or(MergedAnswer{});
+  const FiveNumbers& numbers = merged.numbers;
+  return {numbers.count,         numbers.minimum,           numbers.maximum,
+          numbers.mean,          numbers.squaredDeviations, merged.deviation,
+          merged.logsWithoutMean};
 }
 
 std::string intervalText(const Interval& interval) {
@@ -56,50 +62,66 @@ std::string percentileText(const ShownSet& set, std::size_t index) {
 template <class Use>
 void forEachSet(const ShowSide& side, const Use& use) {
   if (!side.isShown) return;
-  use(side.whole, true);
+  use(side.whole);
   for (const ShownSet& group : side.groups)
-    use(group, false);
+    use(group);
 }
 
-void printFigures(FleetContext& context, const ShowSide& side) {
+void printFigures(FleetContext& context, const ShowSide& side, std::size_t devicesAtLeast) {
   using Align = Table::Align;
-  std::vector<Table::Column> columns = {{""},
-                                        {"DEVICES", Align::Right},
-                                        {"LOGS", Align::Right},
-                                        {"VALUES", Align::Right},
-                                        {"MINIMUM", Align::Right},
-                                        {"MEAN", Align::Right},
-                                        {"MAXIMUM", Align::Right},
-                                        {"STD DEVIATION", Align::Right}};
-  for (const unsigned percent : kPercents) {
-    columns.push_back({std::to_string(percent) + " %", Align::Right});
-  }
-  Table table(std::move(columns), 2);
-  forEachSet(side, [&](const ShownSet& set, bool) {
+  std::vector<Table::Column> columns = {
+      {"", Align::Whole},           {"DEVICES", Align::Right},         {"LOGS", Align::Right, 6},
+      {"VALUES", Align::Right, 5},  {"MINIMUM", Align::Right, 3},      {"MEAN", Align::Right},
+      {"MAXIMUM", Align::Right, 3}, {"STD DEVIATION", Align::Right, 7}};
+  bool hasPercentiles = false;
+  bool areLeftOut = false;
+  bool isUntold = false;
+  forEachSet(side, [&](const ShownSet& set) {
     const Figures figures = figuresOf(set);
-    const std::optional<double> deviation = deviationOf(figures);
-    std::vector<Table::Cell> cells = {set.title,
+    hasPercentiles = hasPercentiles || set.scalar || !set.histogram.percentiles.empty();
+    areLeftOut = areLeftOut || figures.logsWithoutMean != 0;
+    isUntold = isUntold || std::isnan(figures.mean) || std::isnan(figures.minimum) ||
+               std::isnan(figures.maximum) || !figures.deviation;
+  });
+  for (const unsigned percent : kPercents) {
+    const unsigned rank = percent == 50 ? 0 : percent == 25 || percent == 75 ? 4 : 2;
+    if (hasPercentiles) columns.push_back({std::to_string(percent) + " %", Align::Right, rank});
+  }
+  if (areLeftOut) columns.push_back({"NO MEAN", Align::Right});
+  Table table(std::move(columns), 2);
+  forEachSet(side, [&](const ShownSet& set) {
+    const Figures figures = figuresOf(set);
+    std::vector<Table::Cell> cells = {set.name.text(),
                                       std::to_string(set.devices),
                                       std::to_string(set.logs),
                                       std::to_string(figures.values),
-                                      shortNumber(figures.minimum),
-                                      shortNumber(figures.mean),
-                                      shortNumber(figures.maximum),
-                                      deviation ? shortNumber(*deviation) : ""};
-    for (std::size_t i = 0; i < kPercents.size(); ++i)
+                                      figureText(figures.minimum),
+                                      figureText(figures.mean),
+                                      figureText(figures.maximum),
+                                      figures.deviation ? shortNumber(*figures.deviation) : "-"};
+    for (std::size_t i = 0; hasPercentiles && i < kPercents.size(); ++i)
       cells.push_back(percentileText(set, i));
+    cells.push_back(std::to_string(figures.logsWithoutMean));
     table.add(std::move(cells));
   });
   table.print(context.page());
+  if (areLeftOut) context.out() << "  " << noMeanText() << "\n";
+  if (isUntold) {
+    context.out() << "  A figure is - when no log has it, or logs of fewer than " << devicesAtLeast
+                  << " devices.\n";
+  }
 }
 
-void printHistogram(FleetContext& context, const HistogramAnswer& histogram) {
+void printHistogram(FleetContext& context, const HistogramAnswer& histogram,
+                    std::size_t devicesAtLeast) {
   if (histogram.pieces.empty()) return;
   std::uint64_t largest = 1;
-  for (const Piece& piece : histogram.pieces)
+  bool isRange = false;
+  for (const Piece& piece : histogram.pieces) {
     largest = std::max(largest, piece.most);
-  context.out() << "\n";
-  Table table({{""}, {"", Table::Align::Right}, {"", Table::Align::Bar}}, 2);
+    isRange = isRange || piece.least != piece.most;
+  }
+  Table table({{"", Table::Align::Whole}, {"", Table::Align::Right}, {"", Table::Align::Bar}}, 2);
   for (const Piece& piece : histogram.pieces) {
     const std::string count = piece.least == piece.most ? std::to_string(piece.least)
                                                         : std::to_string(piece.least) + " to " +
@@ -108,15 +130,31 @@ void printHistogram(FleetContext& context, const HistogramAnswer& histogram) {
                Table::Cell::bar(static_cast<double>(piece.least), static_cast<double>(largest))});
   }
   table.print(context.page());
+  if (histogram.isJoined) {
+    context.out() << "  Buckets of fewer than " << devicesAtLeast
+                  << " devices are joined with their neighbours.\n";
+  }
+  if (isRange) {
+    context.out() << "  A count is a range where logs have other boundaries, or no histogram.\n";
+  }
+}
+
+void printBuckets(FleetContext& context, const ShowSide& side, std::size_t devicesAtLeast) {
+  bool isFirst = true;
+  forEachSet(side, [&](const ShownSet& set) {
+    context.out() << (isFirst ? "" : "\n") << "  " << printable(set.name.text()) << "\n";
+    isFirst = false;
+    if (set.histogram.pieces.empty()) context.out() << "  no histogram\n";
+    printHistogram(context, set.histogram, devicesAtLeast);
+  });
 }
 
 Json setJson(const ShownSet& set) {
   const Figures figures = figuresOf(set);
-  const std::optional<double> deviation = deviationOf(figures);
-  Json json = {{"title", set.title},
-               {"devices", set.devices},
-               {"logs", set.logs},
-               {"values", figures.values}};
+  Json json = partJson(set.name);
+  json["devices"] = set.devices;
+  json["logs"] = set.logs;
+  json["values"] = figures.values;
   if (set.scalar) {
     json["minimum"] = set.scalar->minimum;
     json["maximum"] = set.scalar->maximum;
@@ -126,7 +164,8 @@ Json setJson(const ShownSet& set) {
   }
   json["mean"] = realJson(figures.mean);
   json["squared_deviations"] = realJson(figures.squaredDeviations);
-  json["standard_deviation"] = deviation ? realJson(*deviation) : Json(nullptr);
+  json["standard_deviation"] = figures.deviation ? realJson(*figures.deviation) : Json(nullptr);
+  if (set.merged) json["logs_without_mean"] = figures.logsWithoutMean;
   Json percentiles = Json::array();
   const HistogramAnswer& histogram = set.histogram;
   for (std::size_t i = 0; i < kPercents.size(); ++i) {
@@ -151,6 +190,12 @@ Json setJson(const ShownSet& set) {
   return json;
 }
 
+/// The first columns of a row.
+void addNames(CsvWriter& csv, const ShowAnswer& answer, const ShowSide& side, const ShownSet& set) {
+  csv.text(answer.request.key).title(kindText(answer)).text(side.title);
+  csv.title(kindText(set.name)).text(set.name.value);
+}
+
 }  // namespace
 
 std::string bucketText(double lower, double upper) {
@@ -162,7 +207,7 @@ const char* kindText(const ShowAnswer& answer) {
   return answer.request.kind == KeyKind::kScalar ? "scalar" : "distribution";
 }
 
-void printShown(FleetContext& context, const ShowAnswer& answer) {
+void printShown(FleetContext& context, const ShowAnswer& answer, bool buckets) {
   std::ostream& out = context.out();
   const std::string& key = answer.request.key;
   out << printable(key) << ": " << kindText(answer);
@@ -177,17 +222,26 @@ void printShown(FleetContext& context, const ShowAnswer& answer) {
       out << "  " << tooFewText(answer.devicesAtLeast) << "\n";
       continue;
     }
-    printFigures(context, side);
+    if (buckets) {
+      printBuckets(context, side, answer.devicesAtLeast);
+    } else {
+      printFigures(context, side, answer.devicesAtLeast);
+    }
     const std::string joined = joinedText(side.joined, !side.groups.empty(), answer.devicesAtLeast);
     if (!joined.empty()) out << "  " << joined << "\n";
-    printHistogram(context, side.whole.histogram);
+    if (buckets || side.whole.histogram.pieces.empty()) continue;
+    out << "\n";
+    printHistogram(context, side.whole.histogram, answer.devicesAtLeast);
   }
 }
 
 Json shownJson(const ShowAnswer& answer) {
   Json sides = Json::array();
   for (const ShowSide& side : answer.sides) {
-    Json json = {{"title", side.title}, {"shown", side.isShown}};
+    const bool isOfVersion = answer.request.againstVersion && &side != &answer.sides.front();
+    Json json = {{"title", side.title},
+                 {"version", isOfVersion ? Json(*answer.request.againstVersion) : Json(nullptr)},
+                 {"shown", side.isShown}};
     if (side.isShown) {
       json["all"] = setJson(side.whole);
       json["groups"] = Json::array();
@@ -207,38 +261,59 @@ Json shownJson(const ShowAnswer& answer) {
 
 void printShownCsv(std::ostream& out, const std::vector<ShowAnswer>& answers) {
   CsvWriter csv(out);
-  for (const char* title : {"key", "kind", "side", "group", "devices", "logs", "values", "minimum",
-                            "maximum", "mean", "squared_deviations"}) {
+  for (const char* title :
+       {"key", "kind", "side", "part", "group", "devices", "logs", "logs_without_mean", "values",
+        "minimum", "maximum", "mean", "squared_deviations", "standard_deviation"}) {
     csv.title(title);
   }
   for (const unsigned percent : kPercents) {
     const std::string name = "p" + std::to_string(percent);
-    csv.title(name + "_above").title(name + "_at_most");
+    csv.title(name).title(name + "_above").title(name + "_at_most");
   }
   csv.endRow();
+  const auto addSet = [&](const ShownSet& set) {
+    const Figures figures = figuresOf(set);
+    csv.integer(set.devices).integer(set.logs).integer(figures.logsWithoutMean);
+    csv.integer(figures.values);
+    if (set.scalar) {
+      csv.integer(set.scalar->minimum).integer(set.scalar->maximum);
+    } else {
+      csv.real(figures.minimum).real(figures.maximum);
+    }
+    csv.real(figures.mean).real(figures.squaredDeviations);
+    figures.deviation ? csv.real(*figures.deviation) : csv.nothing();
+    for (std::size_t i = 0; i < kPercents.size(); ++i) {
+      if (set.scalar) {
+        csv.integer(set.scalar->percentiles[i]).nothing().nothing();
+      } else if (i < set.histogram.percentiles.size()) {
+        const Interval& interval = set.histogram.percentiles[i];
+        csv.nothing().real(interval.lower).real(interval.upper);
+      } else {
+        csv.nothing().nothing().nothing();
+      }
+    }
+    csv.endRow();
+  };
   for (const ShowAnswer& answer : answers) {
     for (const ShowSide& side : answer.sides) {
-      forEachSet(side, [&](const ShownSet& set, bool isWhole) {
-        const Figures figures = figuresOf(set);
-        csv.text(answer.request.key).title(kindText(answer)).text(side.title);
-        csv.text(isWhole ? "" : set.title);
-        csv.integer(set.devices).integer(set.logs).integer(figures.values);
-        if (set.scalar) {
-          csv.integer(set.scalar->minimum).integer(set.scalar->maximum);
-        } else {
-          csv.real(figures.minimum).real(figures.maximum);
+      forEachSet(side, [&](const ShownSet& set) {
+        addNames(csv, answer, side, set);
+        addSet(set);
+      });
+    }
+  }
+}
+
+void printBucketsCsv(std::ostream& out, const std::vector<ShowAnswer>& answers) {
+  CsvWriter csv(out);
+  csv.titles({"key", "kind", "side", "part", "group", "above", "at_most", "least", "most"});
+  for (const ShowAnswer& answer : answers) {
+    for (const ShowSide& side : answer.sides) {
+      forEachSet(side, [&](const ShownSet& set) {
+        for (const Piece& piece : set.histogram.pieces) {
+          addNames(csv, answer, side, set);
+          csv.real(piece.lower).real(piece.upper).integer(piece.least).integer(piece.most).endRow();
         }
-        csv.real(figures.mean).real(figures.squaredDeviations);
-        for (std::size_t i = 0; i < kPercents.size(); ++i) {
-          if (set.scalar) {
-            csv.integer(set.scalar->percentiles[i]).integer(set.scalar->percentiles[i]);
-          } else if (i < set.histogram.percentiles.size()) {
-            csv.real(set.histogram.percentiles[i].lower).real(set.histogram.percentiles[i].upper);
-          } else {
-            csv.nothing().nothing();
-          }
-        }
-        csv.endRow();
       });
     }
   }

@@ -10,9 +10,13 @@
 
 namespace tavrel::fleet {
 
-void printShown(FleetContext& context, const ShowAnswer& answer);
+/// With `buckets`, the histograms of all parts instead of their figures.
+void printShown(FleetContext& context, const ShowAnswer& answer, bool buckets);
 Json shownJson(const ShowAnswer& answer);
+/// A row for each part.
 void printShownCsv(std::ostream& out, const std::vector<ShowAnswer>& answers);
+/// A row for each bucket of each part.
+void printBucketsCsv(std::ostream& out, const std::vector<ShowAnswer>& answers);
 
 /// "(10, 20]", and "(20, inf)" for the last bucket, as in a log.
 std::string bucketText(double lower, double upper);

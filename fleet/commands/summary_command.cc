@@ -59,13 +59,13 @@ void printText(FleetContext& context, const SummaryAnswer& answer) {
   for (const SummaryPart& part : answer.parts) {
     out << "\n";
     using Align = Table::Align;
-    Table table({{nameOf(part.by).title},
+    Table table({{nameOf(part.by).title, Align::Whole},
                  {"DEVICES", Align::Right},
-                 {"LOGS", Align::Right},
-                 {"FIRST DAY"},
-                 {"LAST DAY"}});
+                 {"LOGS", Align::Right, 1},
+                 {"FIRST DAY", Align::Whole, 3},
+                 {"LAST DAY", Align::Whole, 2}});
     for (const CountedGroup& group : part.groups) {
-      table.add({group.title, std::to_string(group.devices), std::to_string(group.logs),
+      table.add({group.name.text(), std::to_string(group.devices), std::to_string(group.logs),
                  date(group.firstDay), date(group.lastDay)});
     }
     if (!table.empty()) table.print(context.page());
@@ -76,11 +76,12 @@ void printText(FleetContext& context, const SummaryAnswer& answer) {
 }
 
 Json groupJson(const CountedGroup& group) {
-  return {{"title", group.title},
-          {"devices", group.devices},
-          {"logs", group.logs},
-          {"first_day", date(group.firstDay)},
-          {"last_day", date(group.lastDay)}};
+  Json json = partJson(group.name);
+  json["devices"] = group.devices;
+  json["logs"] = group.logs;
+  json["first_day"] = date(group.firstDay);
+  json["last_day"] = date(group.lastDay);
+  return json;
 }
 
 Json summaryJson(const SummaryAnswer& answer) {
@@ -103,15 +104,10 @@ Json summaryJson(const SummaryAnswer& answer) {
 
 void printCsv(std::ostream& out, const SummaryAnswer& answer) {
   CsvWriter csv(out);
-  csv.title("by")
-      .title("group")
-      .title("devices")
-      .title("logs")
-      .title("first_day")
-      .title("last_day");
-  csv.endRow();
+  csv.titles({"by", "part", "group", "devices", "logs", "first_day", "last_day"});
   const auto row = [&](const char* by, const CountedGroup& group) {
-    csv.title(by).text(group.title).integer(group.devices).integer(group.logs);
+    csv.title(by).title(kindText(group.name)).text(group.name.value);
+    csv.integer(group.devices).integer(group.logs);
     csv.title(date(group.firstDay)).title(date(group.lastDay)).endRow();
   };
   if (!answer.isShown) return;
@@ -141,14 +137,14 @@ void printKeys(FleetContext& context, const QuestionOptions& options,
   }
   if (options.csv) {
     CsvWriter csv(context.out());
-    csv.title("key").title("kind").title("unit").title("meaning").endRow();
+    csv.titles({"key", "kind", "unit", "meaning"});
     for (const Key& key : keys) {
       const catalogue::Entry entry = entryOf(key);
       csv.text(key.name).title(kindName(key.kind)).title(entry.unit).title(entry.meaning).endRow();
     }
     return;
   }
-  Table table({{"KEY"}, {"KIND"}, {"UNIT"}, {"MEANING"}});
+  Table table({{"KEY", Table::Align::Whole}, {"KIND", Table::Align::Whole}, {"UNIT"}, {"MEANING"}});
   for (const Key& key : keys) {
     const catalogue::Entry entry = entryOf(key);
     table.add({key.name, kindName(key.kind), std::string(entry.unit), std::string(entry.meaning)});

@@ -1,7 +1,6 @@
 // What changed between two versions, in words and as a chart.
 #include <algorithm>
 #include <cmath>
-#include <limits>
 
 #include "catalogue/catalogue.h"
 #include "fleet/pages/sections.h"
@@ -20,16 +19,19 @@ std::string percentText(double share) {
 }
 
 /// By the customary steps of effects in standard deviations.
-std::string_view strengthText(const Comparison& one) {
+std::string strengthText(const Comparison& one) {
   constexpr double kSmall = 0.2;
   constexpr double kMedium = 0.5;
   constexpr double kLarge = 0.8;
-  const double effect =
-      one.effect ? std::abs(*one.effect) : std::numeric_limits<double>::infinity();
-  if (effect < kSmall) return "a slight change: single devices differ far more from each other";
-  if (effect < kMedium) return "a small change beside how devices differ from each other";
-  if (effect < kLarge) return "a clear change beside how devices differ from each other";
-  return "a large change: most devices are affected";
+  if (!one.effect) return "a clear change: daily logs of one version do not differ at all";
+  const double effect = std::abs(*one.effect);
+  const char* const size = effect < kSmall    ? "slight"
+                           : effect < kMedium ? "small"
+                           : effect < kLarge  ? "clear"
+                                              : "large";
+  return std::string("a ") + size +
+         " change: " + page::shortNumber(std::round(effect * 100) / 100) +
+         " times as much as daily logs of one version usually differ from their mean";
 }
 
 /// "fewer than 1 of 1,000".
@@ -40,6 +42,24 @@ std::string chanceText(double probability) {
     if (probability < limit) return text;
   }
   return "fewer than 1 of 20";
+}
+
+const char* kindText(KeyKind kind) {
+  return kind == KeyKind::kScalar ? "daily value" : "daily mean";
+}
+
+/// With the kind where both kinds of the key are compared.
+std::string labelOf(const CompareAnswer& comparison, const Comparison& one) {
+  const bool isAmbiguous =
+      std::ranges::any_of(comparison.comparisons, [&](const Comparison& other) {
+        return other.key.name == one.key.name && other.key.kind != one.key.kind;
+      });
+  const std::string name = nameOf(one.key.name);
+  return isAmbiguous ? name + " (" + kindText(one.key.kind) + ")" : name;
+}
+
+std::size_t logsWithoutMean(const Comparison& one) {
+  return one.before.logsWithoutMean + one.after.logsWithoutMean;
 }
 
 std::size_t changesOf(const CompareAnswer& comparison) {
@@ -60,6 +80,11 @@ std::string nameOf(std::string_view key) {
 std::string_view unitOf(std::string_view key) {
   const catalogue::Entry* entry = catalogue::findStatistic(key);
   return entry == nullptr ? "" : entry->unit;
+}
+
+std::string withoutMeanText(std::size_t logs) {
+  return countText(logs) + (logs == 1 ? " log that has" : " logs that have") +
+         " no mean, because some of the values are not finite or lie too far apart";
 }
 
 std::string changeText(const Comparison& one) {
@@ -95,12 +120,11 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
     const Comparison& one = comparison.comparisons[i];
     html.begin("li");
     html.begin("strong");
-    html.name(nameOf(one.key.name));
+    html.name(labelOf(comparison, one));
     html.text(": " + changeText(one));
     html.end();
-    html.text(". This is " + std::string(strengthText(one)) +
-              ". Chance alone would show such a difference in " + chanceText(one.corrected) +
-              " comparisons.");
+    html.text(". This is " + strengthText(one) + ". Chance alone would show such a difference in " +
+              chanceText(one.corrected) + " comparisons.");
     html.end();
   }
   if (changes > kMostSentences) {
@@ -115,10 +139,11 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
       html.begin("p");
       html.text("Flash: ");
       html.name(nameOf(wear.request.key));
-      html.text(", half of the devices up to " +
+      html.text(" is at most " +
                 page::figureText(static_cast<double>(all.scalar->percentiles[2]), unit) +
-                ", one of twenty above " +
-                page::figureText(static_cast<double>(all.scalar->percentiles[4]), unit) + ".");
+                " in half of the daily logs, and above " +
+                page::figureText(static_cast<double>(all.scalar->percentiles[4]), unit) +
+                " in no more than one of twenty.");
       html.end();
     }
   }
@@ -148,20 +173,21 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     }
     if (!one.relative || !std::isfinite(one.margin)) continue;
     const double scale = 100 / std::abs(one.before.mean);
-    chart.rows.push_back({nameOf(one.key.name), (one.difference - one.margin) * scale,
+    chart.rows.push_back({labelOf(comparison, one), (one.difference - one.margin) * scale,
                           one.difference * scale, (one.difference + one.margin) * scale,
                           one.isReal() ? changeText(one) : "no change beyond chance",
                           one.isReal()});
   }
   if (!chart.rows.empty()) writeIntervals(html, chart);
   if (unchanged != 0) {
-    html.element("p", countText(unchanged) + " more statistics did not change.",
+    html.element("p", countText(unchanged) + " more statistics show no change beyond chance.",
                  {{"class", "note"}});
   }
 
   using Align = page::Table::Align;
   page::Table table(html, "Changes",
                     {{"Statistic", Align::Name},
+                     {"Compared", Align::Text},
                      {"Before", Align::Number},
                      {"After", Align::Number},
                      {"Standard deviations", Align::Number},
@@ -171,18 +197,25 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     const std::string_view unit = unitOf(one.key.name);
     table.row();
     table.cell([&](page::HtmlWriter& cell) { cell.name(one.key.name); });
+    table.cell(kindText(one.key.kind));
     table.cell(page::figureText(one.before.mean, unit));
     table.cell(page::figureText(one.after.mean, unit));
     table.cell(one.effect ? page::shortNumber(std::round(*one.effect * 100) / 100) : "constant");
     table.cell(countText(one.before.devices) + " and " + countText(one.after.devices));
   }
   table.end();
+  for (const Comparison& one : comparison.comparisons) {
+    if (!one.isReal() || logsWithoutMean(one) == 0) continue;
+    html.begin("p", {{"class", "note"}});
+    html.name(one.key.name);
+    html.text(" is compared without " + withoutMeanText(logsWithoutMean(one)) + ".");
+    html.end();
+  }
   const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;
   if (leftOut != 0) {
     html.element("p",
                  "Left out: " + countText(leftOut) + (leftOut == 1 ? " statistic" : " statistics") +
-                     " not in both versions, of too few devices, or with values that are no finite "
-                     "numbers.",
+                     " not in both versions, of too few devices, or without a mean.",
                  {{"class", "note"}});
   }
 }

@@ -114,7 +114,7 @@ std::string textOf(const FleetPage& page) {
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
                         " devices are not shown by themselves. Statistics leave such versions out; "
                         "in \"The fleet\" they are joined as \"" +
-                        std::string(kOtherTitle) +
+                        PartName{PartKind::kOther}.text() +
                         "\", and where they could be told by a subtraction, so is the next larger "
                         "group. Buckets of histograms are joined in the same way.");
   html.element("p",

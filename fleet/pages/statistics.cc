@@ -18,8 +18,8 @@ void writeGroups(page::HtmlWriter& html, const char* title, const SummaryPart& p
   html.element("h3", title);
   std::vector<page::Bar> bars;
   for (const CountedGroup& group : part.groups) {
-    bars.push_back(
-        {group.title, static_cast<double>(group.devices), countText(group.devices) + " devices"});
+    bars.push_back({group.name.text(), static_cast<double>(group.devices),
+                    countText(group.devices) + " devices"});
   }
   if (!bars.empty()) {
     writeBars(html, title, bars);
@@ -54,8 +54,9 @@ std::string percentileText(const ShownSet& set, std::size_t index, std::string_v
 }
 
 std::string meanText(const ShownSet& set, std::string_view unit) {
-  const double mean = set.scalar ? set.scalar->mean : set.merged.value_or(FiveNumbers{}).mean;
-  return std::isfinite(mean) ? cellText(mean, unit) : "";
+  const double mean =
+      set.scalar ? set.scalar->mean : set.merged.value_or(MergedAnswer{}).numbers.mean;
+  return std::isfinite(mean) ? cellText(mean, unit) : "not told";
 }
 
 void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& name,
@@ -72,7 +73,7 @@ void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& 
   page::Table table(html, name, std::move(columns));
   const auto row = [&](const ShownSet& set) {
     table.row();
-    table.cell([&](page::HtmlWriter& cell) { cell.name(set.title); });
+    table.cell([&](page::HtmlWriter& cell) { cell.name(set.name.text()); });
     table.cell(countText(set.devices));
     table.cell(meanText(set, unit));
     for (std::size_t i = 0; i < kPercents.size() && hasPercentiles; ++i) {
@@ -97,9 +98,9 @@ void writeHistogramOf(page::HtmlWriter& html, const ShownSet& set, const std::st
   if (bars.size() < 2) return;
   html.begin("div", {{"class", "card"}});
   html.begin("h3");
-  html.name(set.title);
+  html.name(set.name.text());
   html.end();
-  writeBars(html, name + ", " + set.title, bars);
+  writeBars(html, name + ", " + set.name.text(), bars);
   html.end();
 }
 
@@ -122,7 +123,7 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
     chart.text = [](double value) { return page::shortNumber(value); };
     std::int32_t next = summary.whole.firstDay;
     for (const CountedGroup& group : part.groups) {
-      if (group.title == kOtherTitle) continue;
+      if (!group.name.isValue()) continue;
       for (; next < group.firstDay; ++next)
         chart.values.push_back(std::nullopt);
       chart.values.push_back(static_cast<double>(group.devices));
@@ -150,10 +151,20 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
     html.name(name);
     html.end();
     html.begin("p", {{"class", "note"}});
-    html.name(name == answer.request.key ? "" : answer.request.key);
+    if (name != answer.request.key) {
+      html.name(answer.request.key);
+      html.text(", ");
+    }
+    const bool isScalar = answer.request.kind == KeyKind::kScalar;
+    html.text(isScalar ? "one value a log" : "many values a log");
     if (!unit.empty()) html.text(", in " + std::string(unit));
     html.end();
     writeSets(html, side, name, unit);
+    const std::size_t withoutMean = side.whole.merged ? side.whole.merged->logsWithoutMean : 0;
+    if (withoutMean != 0) {
+      html.element("p", "The mean is without " + withoutMeanText(withoutMean) + ".",
+                   {{"class", "note"}});
+    }
     html.begin("div", {{"class", "cards"}});
     if (side.groups.empty()) writeHistogramOf(html, side.whole, name);
     for (const ShownSet& group : side.groups)

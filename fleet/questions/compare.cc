@@ -11,6 +11,7 @@
 
 #include "fleet/questions/exact_moments.h"
 #include "fleet/questions/grouping.h"
+#include "fleet/questions/merged_numbers.h"
 #include "fleet/questions/student.h"
 
 namespace tavrel::fleet {
@@ -36,9 +37,26 @@ std::vector<Side> sidesOf(const LogTable& table, const CompareRequest& request) 
 
 /// What the logs of one side tell of one key.
 struct Sample {
-  explicit Sample(const LogTable& table) : logs(table) {}
+  explicit Sample(const LogTable& logTable) : table(logTable), logs(logTable) {}
 
+  void add(LogIndex log, std::int64_t value) {
+    logs.insert(log);
+    moments.add(value);
+  }
+  void add(LogIndex log, const FiveNumbers& numbers) {
+    logs.insert(log);
+    if (hasMean(numbers)) {
+      moments.add(numbers.mean);
+    } else {
+      if (!withoutMean) withoutMean.emplace(table);
+      withoutMean->insert(log);
+    }
+  }
+  LogSet withMean() const { return withoutMean ? logs.differenceWith(*withoutMean) : logs; }
+
+  const LogTable& table;
   LogSet logs;
+  std::optional<LogSet> withoutMean;
   ExactMoments moments;
 };
 
@@ -68,25 +86,37 @@ struct Measured {
   double variance = 0;
 };
 
-struct KeyResult {
-  std::array<LogSet, 2> logs;
-  std::array<std::optional<Measured>, 2> measured;
-};
+struct SideResult {
+  const LogSet& logsWithMean() const { return withMean ? *withMean : logs; }
 
-std::optional<Measured> measure(const Sample& sample, const LogTable& table) {
+  LogSet logs;
+  std::optional<LogSet> withMean;  // where that is not all logs
+  std::optional<Measured> measured;
+};
+using KeyResult = std::array<SideResult, 2>;
+
+std::optional<Measured> measure(const Sample& sample, const LogSet& withMean) {
   Measured result;
   ComparedSide& side = result.side;
-  side.logs = sample.logs.logs();
-  side.devices = sample.logs.devices(table);
+  side.logs = withMean.logs();
+  side.logsWithoutMean = sample.logs.logs() - side.logs;
+  side.devices = withMean.devices(sample.table);
   side.mean = sample.moments.mean();
   const double squared = sample.moments.squaredDeviations();
-  if (!std::isfinite(side.mean) || !std::isfinite(squared)) return std::nullopt;
+  if (side.logs == 0 || !std::isfinite(squared)) return std::nullopt;
   const auto logs = static_cast<double>(side.logs);
-  result.independent = independentValues(sample.logs.logsByDay(table));
+  result.independent = independentValues(withMean.logsByDay(sample.table));
   if (result.independent <= 1) return std::nullopt;
   result.variance = squared / logs * (result.independent / (result.independent - 1));
   result.squaredError = result.variance / result.independent;
   side.deviation = std::sqrt(result.variance);
+  return result;
+}
+
+SideResult resultOf(const Sample& sample) {
+  SideResult result{sample.logs, std::nullopt, std::nullopt};
+  if (sample.withoutMean) result.withMean = sample.withMean();
+  result.measured = measure(sample, result.logsWithMean());
   return result;
 }
 
@@ -165,21 +195,26 @@ class Comparer {
         ++answer.missing;
         continue;
       }
-      const auto& [before, after] = results_[i]->logs;
-      const std::string subject =
-          (keys_[i].kind == KeyKind::kScalar ? "scalar " : "distribution ") + keys_[i].name;
-      if (!ledger.allows(subject, before) || !ledger.allows(subject, after)) {
+      const auto& [before, after] = *results_[i];
+      const std::string subject = subjectOf(keys_[i].kind, keys_[i].name);
+      const std::string means = subjectOfMeans(keys_[i].kind, keys_[i].name);
+      const auto isAllowed = [&](const SideResult& side) {
+        return ledger.allows(subject, side.logs) &&
+               (side.logsWithMean().empty() || ledger.allows(means, side.logsWithMean()));
+      };
+      if (!isAllowed(before) || !isAllowed(after)) {
         ++answer.tooFew;
         continue;
       }
-      const auto& [measuredBefore, measuredAfter] = results_[i]->measured;
-      if (!measuredBefore || !measuredAfter) {
+      if (!before.measured || !after.measured) {
         ++answer.unfit;
         continue;
       }
-      ledger.noteShown(subject, before);
-      ledger.noteShown(subject, after);
-      answer.comparisons.push_back(comparisonOf(keys_[i], *measuredBefore, *measuredAfter));
+      for (const SideResult& side : *results_[i]) {
+        ledger.noteShown(subject, side.logs);
+        ledger.noteShown(means, side.logsWithMean());
+      }
+      answer.comparisons.push_back(comparisonOf(keys_[i], *before.measured, *after.measured));
     }
     return answer;
   }
@@ -188,12 +223,10 @@ class Comparer {
   std::unique_ptr<KeyResult> read(Engine& engine, const Key& key) const {
     const LogTable& table = ledger_.table();
     std::array<Sample, 2> samples = {Sample(table), Sample(table)};
-    const auto add = [&](LogId id, auto value) {
+    const auto add = [&](LogId id, const auto& value) {
       const LogIndex log = table.find(id);
       if (log == kNoLog || sides_[log] == Side::kNeither) return;
-      Sample& sample = samples[static_cast<std::size_t>(sides_[log])];
-      sample.logs.insert(log);
-      sample.moments.add(value);
+      samples[static_cast<std::size_t>(sides_[log])].add(log, value);
     };
     if (key.kind == KeyKind::kScalar) {
       engine.scalars(key.name, [&](std::span<const ScalarValue> rows) {
@@ -203,14 +236,13 @@ class Comparer {
     } else {
       engine.distributions(key.name, [&](std::span<const DistributionValue> rows) {
         for (const DistributionValue& row : rows) {
-          if (row.numbers.count != 0) add(row.log, row.numbers.mean);
+          if (row.numbers.count != 0) add(row.log, row.numbers);
         }
       });
     }
     const auto& [before, after] = samples;
     if (before.logs.empty() || after.logs.empty()) return nullptr;
-    return std::make_unique<KeyResult>(
-        KeyResult{{before.logs, after.logs}, {measure(before, table), measure(after, table)}});
+    return std::make_unique<KeyResult>(KeyResult{resultOf(before), resultOf(after)});
   }
 
   const Ledger& ledger_;
@@ -260,8 +292,8 @@ std::optional<std::pair<std::string, std::string>> newestVersions(const Ledger& 
   }
   std::vector<std::string> versions;
   for (const Group& group : groupsOf(table, all, GroupBy::kOs, ledger.devicesAtLeast())) {
-    if (group.isSmall || !ledger.hasEnough(group.logs)) continue;
-    if (table.number(Attribute::kOs, group.title)) versions.push_back(group.title);
+    if (!group.name.isValue() || !ledger.hasEnough(group.logs)) continue;
+    versions.push_back(group.name.value);
   }
   if (versions.size() < 2) return std::nullopt;
   return std::pair(versions[versions.size() - 2], versions.back());

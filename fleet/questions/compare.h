@@ -1,10 +1,10 @@
 // Which statistics differ between two versions of the system.
 //
-// The values of a scalar, or the means of a distribution, are taken log by log. A device that
-// reports on several days gives several logs, which are not independent of each other, and nobody
-// can tell which. So the mean is that of all logs, but it counts as if it were of as few
-// independent values as the numbers of logs a day allow: its true uncertainty is not larger,
-// whatever the logs of a device have in common.
+// The values of a scalar, or the means of a distribution, are taken log by log; logs whose mean is
+// no finite number are left out and counted. A device that reports on several days gives several
+// logs, which are not independent of each other, and nobody can tell which. So the mean is that of
+// all logs, but it counts as if it were of as few independent values as the numbers of logs a day
+// allow: its true uncertainty is not larger, whatever the logs of a device have in common.
 #pragma once
 
 #include <cstdint>
@@ -28,7 +28,8 @@ struct CompareRequest {
 
 struct ComparedSide {
   std::size_t logs = 0;
-  std::size_t devices = 0;  ///< the largest number of logs on one day
+  std::size_t logsWithoutMean = 0;  ///< not among `logs`
+  std::size_t devices = 0;          ///< the largest number of logs on one day
   double mean = 0;
   std::optional<double> deviation;  ///< standard deviation over logs
 };
@@ -58,7 +59,7 @@ struct CompareAnswer {
   std::vector<Comparison> comparisons;
   std::size_t missing = 0;  ///< keys that only one version, or none, has
   std::size_t tooFew = 0;   ///< keys that one version has of too few devices
-  std::size_t unfit = 0;    ///< keys with means that are no finite numbers
+  std::size_t unfit = 0;    ///< keys without logs that have a mean, in one version
 };
 
 /// Reads the keys one by one, in two threads. Throws EngineError.

@@ -10,7 +10,6 @@ namespace tavrel::fleet {
 namespace {
 
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
-constexpr double kInfinity = std::numeric_limits<double>::infinity();
 
 /// mantissa × 2^exponent, without the sign.
 struct Parts {
@@ -54,20 +53,10 @@ void ExactMoments::addTerm(std::uint64_t mantissa, int exponent, bool isNegative
 
 void ExactMoments::add(double mean, double squaredDeviations, std::uint64_t count) {
   if (count == 0 || !grow(count)) return;
-  if (std::isfinite(mean)) {
-    const Parts parts = partsOf(mean);
-    addTerm(parts.mantissa, parts.exponent, std::signbit(mean), count);
-  } else if (std::isnan(mean)) {
-    hasNan_ = true;
-  } else {
-    hasInfinity_[mean < 0 ? 1 : 0] = true;
-  }
+  Parts parts = partsOf(mean);
+  addTerm(parts.mantissa, parts.exponent, std::signbit(mean), count);
   if (squaredDeviations == 0) return;
-  if (!std::isfinite(squaredDeviations)) {
-    hasStrangeDeviations_ = true;
-    return;
-  }
-  const Parts parts = partsOf(squaredDeviations);
+  parts = partsOf(squaredDeviations);
   squares_.add(multiply(parts.mantissa, 1), static_cast<std::size_t>(parts.exponent - 2 * kLastBit),
                std::signbit(squaredDeviations));
 }
@@ -78,28 +67,15 @@ void ExactMoments::add(std::int64_t value) {
   addTerm(value < 0 ? -bits : bits, 0, value < 0, 1);
 }
 
-void ExactMoments::add(const ExactMoments& other) {
-  overflowed_ = overflowed_ || other.overflowed_;
-  hasNan_ = hasNan_ || other.hasNan_;
-  hasStrangeDeviations_ = hasStrangeDeviations_ || other.hasStrangeDeviations_;
-  for (const int sign : {0, 1})
-    hasInfinity_[sign] = hasInfinity_[sign] || other.hasInfinity_[sign];
-  if (!grow(other.count_)) return;
-  sum_.add(other.sum_);
-  squares_.add(other.squares_);
-}
-
 double ExactMoments::mean() const {
-  if (count_ == 0 || overflowed_ || hasNan_ || (hasInfinity_[0] && hasInfinity_[1])) return kNan;
-  if (hasInfinity_[0]) return kInfinity;
-  if (hasInfinity_[1]) return -kInfinity;
+  if (count_ == 0 || overflowed_) return kNan;
   WideSum<kSumLimbs>::Limbs magnitude;
   const bool isNegative = subtract(sum_.positive(), sum_.negative(), magnitude);
   return nearestQuotient(magnitude, count_, kLastBit, isNegative);
 }
 
 double ExactMoments::squaredDeviations() const {
-  if (!std::isfinite(mean()) || hasStrangeDeviations_) return kNan;
+  if (count_ == 0 || overflowed_) return kNan;
 
   // (count × squares - sum²) / count, without a rounding before the division.
   constexpr std::size_t kLimbs = 2 * kSumLimbs;

@@ -12,21 +12,20 @@ namespace tavrel::fleet {
 
 class ExactMoments {
  public:
-  /// `count` values of this mean whose squared deviations from it add up to `squaredDeviations`.
+  /// `count` values of this mean whose squared deviations from it add up to `squaredDeviations`;
+  /// both are finite.
   void add(double mean, double squaredDeviations, std::uint64_t count);
   void add(double value) { add(value, 0, 1); }
   void add(std::int64_t value);
-  void add(const ExactMoments& other);
 
   /// Stays at 2^64 - 1 when there are more.
   std::uint64_t count() const { return count_; }
 
-  /// The mean of all values. Not-a-number without values, when a mean was not-a-number, when both
-  /// infinities are among them, and when the count does not fit; an infinity when one was.
+  /// The mean of all values. Not-a-number without values, and when the count does not fit.
   double mean() const;
 
   /// The sum of squared deviations from `mean()`, not divided by the count. Not-a-number when the
-  /// mean is no finite number or a sum of squared deviations was none.
+  /// mean is.
   double squaredDeviations() const;
 
  private:
@@ -42,9 +41,6 @@ class ExactMoments {
   WideSum<kSquaresLimbs> squares_;  // also the squared deviations of summaries
   std::uint64_t count_ = 0;
   bool overflowed_ = false;
-  bool hasInfinity_[2] = {false, false};  // positive, negative
-  bool hasNan_ = false;
-  bool hasStrangeDeviations_ = false;
 };
 
 }  // namespace tavrel::fleet

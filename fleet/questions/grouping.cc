@@ -52,7 +52,7 @@ bool versionLess(std::string_view a, std::string_view b) {
 
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast) {
-  if (by == GroupBy::kNone) return {{"all", logs}};
+  if (by == GroupBy::kNone) return {{{PartKind::kWhole}, logs}};
 
   // Each attribute as a number into its values.
   const Attribute of = by == GroupBy::kOs       ? Attribute::kOs
@@ -92,9 +92,9 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
     groupOf[value] = groups.size();
     const std::string text =
         byDay ? dateText(civilFromDays(table.days()[value].day)) : texts[value];
-    groups.push_back({text.empty() ? "(not told)" : text, LogSet(table)});
+    groups.push_back({{text.empty() ? PartKind::kNotTold : PartKind::kValue, text}, LogSet(table)});
   }
-  groups.push_back({kOtherTitle, LogSet(table), smallValues, true});
+  groups.push_back({{PartKind::kOther}, LogSet(table), smallValues});
   for (LogIndex log = 0; log < table.size(); ++log) {
     if (logs.contains(log)) groups[groupOf[valueOf(log)]].logs.insert(log);
   }

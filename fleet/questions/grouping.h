@@ -17,7 +17,7 @@ bool versionLess(std::string_view a, std::string_view b);
 
 /// One group for each value of the attribute that occurs among `logs`, in their order (versions as
 /// numbered, days as they passed); `kNone` has one group. Values with fewer than `logsAtLeast`
-/// logs, and those after the thousand most frequent ones, come as one small group.
+/// logs, and those after the thousand most frequent ones, come as one group of the kind kOther.
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast);
 

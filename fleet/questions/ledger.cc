@@ -47,6 +47,14 @@ void Ledger::noteShown(const std::string& subject, const LogSet& logs) {
   if (std::find(sets.begin(), sets.end(), kept) == sets.end()) sets.push_back(std::move(kept));
 }
 
+std::string subjectOf(KeyKind kind, const std::string& key) {
+  return (kind == KeyKind::kScalar ? "scalar " : "distribution ") + key;
+}
+
+std::string subjectOfMeans(KeyKind kind, const std::string& key) {
+  return kind == KeyKind::kScalar ? subjectOf(kind, key) : "mean of " + subjectOf(kind, key);
+}
+
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups) {
   const LogTable& table = ledger.table();
   Division division{LogSet(table), false, {}, 0};
@@ -65,7 +73,8 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   std::vector<Part> parts;
   for (std::size_t i = 0; i < groups.size(); ++i) {
     const LogSet& logs = groups[i].logs;
-    parts.push_back({logs.devices(table), i, !groups[i].isSmall && ledger.allows(subject, logs)});
+    const bool isAllowed = groups[i].name.kind != PartKind::kOther && ledger.allows(subject, logs);
+    parts.push_back({logs.devices(table), i, isAllowed});
   }
   std::stable_sort(parts.begin(), parts.end(), [](const Part& a, const Part& b) {
     return a.isAllowed != b.isAllowed ? b.isAllowed : a.devices < b.devices;
@@ -87,7 +96,7 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   for (std::size_t i = 0; i < groups.size(); ++i) {
     if (!isJoined[i]) division.groups.push_back(std::move(groups[i]));
   }
-  if (joined != 0) division.groups.push_back({kOtherTitle, std::move(other)});
+  if (joined != 0) division.groups.push_back({{PartKind::kOther}, std::move(other)});
   for (const Group& group : division.groups)
     ledger.noteShown(subject, group.logs);
   return division;

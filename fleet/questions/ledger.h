@@ -10,7 +10,9 @@
 #include <string>
 #include <vector>
 
+#include "fleet/engine/engine.h"
 #include "fleet/questions/log_set.h"
+#include "fleet/questions/part_name.h"
 
 namespace tavrel::fleet {
 
@@ -49,11 +51,16 @@ class Ledger {
   std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;
 };
 
+/// What answers about a statistic are about, as subjects of the ledger: all figures but means, and
+/// means. They differ when logs of a distribution have no mean.
+std::string subjectOf(KeyKind kind, const std::string& key);
+std::string subjectOfMeans(KeyKind kind, const std::string& key);
+
+/// One of the kind kOther is not shown by itself.
 struct Group {
-  std::string title;
+  PartName name;
   LogSet logs;
   std::size_t values = 1;  ///< how many values of the attribute it stands for
-  bool isSmall = false;    ///< whether it must not be shown by itself
 };
 
 /// A set of logs and its parts.
@@ -61,12 +68,9 @@ struct Division {
   LogSet whole;
   bool isShown = false;  ///< when not, nothing of it may be shown
   std::vector<Group> groups;
-  /// How many values were joined as the last group, `kOtherTitle`.
+  /// How many values were joined as the last group, of the kind kOther.
   std::size_t joined = 0;
 };
-
-/// The title of the group of joined ones; no group of one value is called so.
-inline constexpr const char* kOtherTitle = "(other)";
 
 /// Divides the union of the groups, which have no log in common, into parts that may be shown, and
 /// notes these and the whole as shown. Groups of too few devices are joined, and with them as many

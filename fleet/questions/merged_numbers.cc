@@ -1,6 +1,8 @@
 #include "fleet/questions/merged_numbers.h"
 
+#include <algorithm>
 #include <cmath>
+#include <limits>
 
 namespace tavrel::fleet {
 
@@ -13,25 +15,39 @@ bool isLess(double a, double b) {
 
 }  // namespace
 
+bool hasMean(const FiveNumbers& numbers) {
+  return std::isfinite(numbers.mean) && std::isfinite(numbers.squaredDeviations);
+}
+
 void MergedNumbers::add(const FiveNumbers& numbers) {
   if (numbers.count == 0) return;
-  const bool isFirst = moments_.count() == 0;
-  if (isFirst || std::isnan(minimum_) || isLess(numbers.minimum, minimum_)) {
+  if (isEmpty_ || std::isnan(minimum_) || isLess(numbers.minimum, minimum_)) {
     minimum_ = numbers.minimum;
   }
-  if (isFirst || std::isnan(maximum_) || isLess(maximum_, numbers.maximum)) {
+  if (isEmpty_ || std::isnan(maximum_) || isLess(maximum_, numbers.maximum)) {
     maximum_ = numbers.maximum;
   }
-  moments_.add(numbers.mean, numbers.squaredDeviations, numbers.count);
+  isEmpty_ = false;
+  constexpr auto kMost = std::numeric_limits<std::uint64_t>::max();
+  count_ += std::min(numbers.count, kMost - count_);
+  if (hasMean(numbers)) {
+    moments_.add(numbers.mean, numbers.squaredDeviations, numbers.count);
+  } else {
+    ++logsWithoutMean_;
+  }
 }
 
 FiveNumbers MergedNumbers::numbers() const {
-  if (moments_.count() == 0) return {};
-  return {minimum_, maximum_, moments_.mean(), moments_.squaredDeviations(), moments_.count()};
+  if (isEmpty_) return {};
+  return {minimum_, maximum_, moments_.mean(), moments_.squaredDeviations(), count_};
 }
 
-std::optional<double> standardDeviation(const FiveNumbers& numbers) {
-  const double variance = numbers.squaredDeviations / static_cast<double>(numbers.count);
+std::optional<double> MergedNumbers::standardDeviation() const {
+  return fleet::standardDeviation(moments_.squaredDeviations(), moments_.count());
+}
+
+std::optional<double> standardDeviation(double squaredDeviations, std::uint64_t values) {
+  const double variance = squaredDeviations / static_cast<double>(values);
   if (!(variance >= 0) || std::isinf(variance)) return std::nullopt;
   return std::sqrt(variance);
 }

@@ -1,6 +1,7 @@
 // The five numbers of the values of many logs, as if one log had counted them all.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 #include <optional>
 
@@ -9,24 +10,37 @@
 
 namespace tavrel::fleet {
 
+/// Whether a mean can be made of these and others: mean and squared deviations are not finite when
+/// a value was not, or when the values lie too far apart.
+bool hasMean(const FiveNumbers& numbers);
+
 class MergedNumbers {
  public:
-  /// A summary without values changes nothing.
+  /// A summary without values changes nothing. One without a mean counts, but for mean and
+  /// deviations.
   void add(const FiveNumbers& numbers);
 
   /// Five zeros without values, as in a log. The count stays at 2^64 - 1 when there are more.
   /// Minimum and maximum are not-a-number only when they are in every log. Mean and squared
-  /// deviations are the doubles nearest to the exact ones; not-a-number and infinities in them are
-  /// described at ExactMoments.
+  /// deviations are the doubles nearest to the exact ones; not-a-number when no summary has a mean
+  /// or the count does not fit.
   FiveNumbers numbers() const;
 
+  /// Of the values that the mean is of; nothing without a mean.
+  std::optional<double> standardDeviation() const;
+
+  std::size_t logsWithoutMean() const { return logsWithoutMean_; }
+
  private:
+  bool isEmpty_ = true;
   double minimum_ = 0;
   double maximum_ = 0;
+  std::uint64_t count_ = 0;
   ExactMoments moments_;
+  std::size_t logsWithoutMean_ = 0;
 };
 
-/// The root of the mean squared deviation; nothing when that is no number.
-std::optional<double> standardDeviation(const FiveNumbers& numbers);
+/// The root of the mean squared deviation; nothing when that is no finite number.
+std::optional<double> standardDeviation(double squaredDeviations, std::uint64_t values);
 
 }  // namespace tavrel::fleet

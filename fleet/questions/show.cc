@@ -15,6 +15,7 @@ namespace tavrel::fleet {
 namespace {
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
+constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
 /// The rows of the key, by log. Distributions without values are left out.
 struct Rows {
@@ -54,8 +55,11 @@ Rows readRows(Engine& engine, const LogTable& table, const ShowRequest& request)
 /// Tells of the parts of one side.
 class SideAnswer {
  public:
-  SideAnswer(const LogTable& table, const Rows& rows, std::size_t devicesAtLeast)
-      : table_(table), rows_(rows), devicesAtLeast_(devicesAtLeast) {}
+  SideAnswer(Ledger& ledger, const Rows& rows, std::string subjectOfMeans)
+      : ledger_(ledger),
+        table_(ledger.table()),
+        rows_(rows),
+        subjectOfMeans_(std::move(subjectOfMeans)) {}
 
   ShowSide answer(std::string title, const Division& division) {
     ShowSide side{
@@ -65,15 +69,15 @@ class SideAnswer {
 
     // Without groups, the whole is the only part.
     std::vector<Group> parts = division.groups;
-    if (parts.empty()) parts.push_back({"all", division.whole});
+    if (parts.empty()) parts.push_back({{PartKind::kWhole}, division.whole});
     partOf_.assign(table_.size(), parts.size());
     for (std::size_t part = 0; part < parts.size(); ++part) {
       parts[part].logs.forEach([&](LogIndex log) { partOf_[log] = part; });
     }
     std::vector<ShownSet> sets;
     for (const Group& part : parts)
-      sets.push_back(setOf(part.title, part.logs));
-    side.whole = setOf("all", division.whole);
+      sets.push_back(setOf(part.name, part.logs));
+    side.whole = setOf({PartKind::kWhole}, division.whole);
 
     spread(sets, side.whole);
     merge(sets, side.whole);
@@ -83,11 +87,11 @@ class SideAnswer {
   }
 
  private:
-  ShownSet setOf(const std::string& title, const LogSet& logs) const {
-    return {title, logs.logs(), logs.devices(table_), std::nullopt, std::nullopt, {}};
+  ShownSet setOf(const PartName& name, const LogSet& logs) const {
+    return {name, logs.logs(), logs.devices(table_), std::nullopt, std::nullopt, {}};
   }
 
-  /// Hands out the values of each part of the side and then of the whole.
+  /// Hands out the values of the whole and then of each part of the side.
   template <class Value, class Use>
   void forEachPart(const std::vector<std::pair<LogIndex, Value>>& rows, std::vector<ShownSet>& sets,
                    ShownSet& whole, const Use& use) const {
@@ -99,9 +103,9 @@ class SideAnswer {
       ofPart[part].push_back(&row);
       ofPart.back().push_back(&row);
     }
+    use(ofPart.back(), whole);
     for (std::size_t i = 0; i < sets.size(); ++i)
       use(ofPart[i], sets[i]);
-    use(ofPart.back(), whole);
   }
 
   void spread(std::vector<ShownSet>& sets, ShownSet& whole) const {
@@ -124,11 +128,20 @@ class SideAnswer {
   }
 
   void merge(std::vector<ShownSet>& sets, ShownSet& whole) const {
-    forEachPart(rows_.distributions, sets, whole, [](const auto& rows, ShownSet& set) {
+    forEachPart(rows_.distributions, sets, whole, [&](const auto& rows, ShownSet& set) {
       MergedNumbers merged;
-      for (const auto* row : rows)
+      LogSet withMean(table_);
+      for (const auto* row : rows) {
         merged.add(row->second);
-      set.merged = merged.numbers();
+        if (hasMean(row->second)) withMean.insert(row->first);
+      }
+      set.merged = {merged.numbers(), merged.standardDeviation(), merged.logsWithoutMean()};
+      if (ledger_.allows(subjectOfMeans_, withMean)) {
+        ledger_.noteShown(subjectOfMeans_, withMean);
+        return;
+      }
+      set.merged->numbers.mean = set.merged->numbers.squaredDeviations = kNan;
+      set.merged->deviation = std::nullopt;
     });
   }
 
@@ -155,7 +168,7 @@ class SideAnswer {
     std::vector<Cell> all;
     HistogramAnswer& total = whole.histogram;
     for (std::size_t i = 0; i < sets.size(); ++i) {
-      const CellClasses::Coarsened coarsened = classes[i].coarsened(devicesAtLeast_);
+      const CellClasses::Coarsened coarsened = classes[i].coarsened(ledger_.devicesAtLeast());
       fill(sets[i].histogram, coarsened.cells);
       sets[i].histogram.isJoined = coarsened.isJoined;
       all.insert(all.end(), coarsened.cells.begin(), coarsened.cells.end());
@@ -185,9 +198,10 @@ class SideAnswer {
     if (rows_.scalars.empty()) answer.percentiles = percentilesOf(cells, kPercents);
   }
 
+  Ledger& ledger_;
   const LogTable& table_;
   const Rows& rows_;
-  const std::size_t devicesAtLeast_;
+  const std::string subjectOfMeans_;
   std::vector<std::size_t> partOf_;  // of each log; the number of parts when it is in none
 };
 
@@ -209,9 +223,8 @@ LogSet logsOf(const LogTable& table, const Rows& rows, const auto& isOnSide) {
 ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
   const LogTable& table = ledger.table();
   const Rows rows = readRows(engine, table, request);
-  const std::string subject =
-      (request.kind == KeyKind::kScalar ? "scalar " : "distribution ") + request.key;
-  SideAnswer answers(table, rows, ledger.devicesAtLeast());
+  const std::string subject = subjectOf(request.kind, request.key);
+  SideAnswer answers(ledger, rows, subjectOfMeans(request.kind, request.key));
   ShowAnswer answer{request, ledger.devicesAtLeast(), {}};
 
   const auto addSide = [&](std::string title, const auto& isOnSide) {
@@ -219,7 +232,7 @@ ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
     std::vector<Group> groups = groupsOf(table, logs, request.by, ledger.devicesAtLeast());
     if (request.leavesSmallOut) {
       std::erase_if(groups, [&](const Group& group) {
-        return group.isSmall || !ledger.hasEnough(group.logs);
+        return group.name.kind == PartKind::kOther || !ledger.hasEnough(group.logs);
       });
     }
     Division division = divide(ledger, subject, std::move(groups));
@@ -234,7 +247,7 @@ ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
     return request.days.contains(table.day(log)) && !(request.againstVersion && isOfVersion(log));
   });
   if (request.againstVersion) {
-    addSide(*request.againstVersion, [&](LogIndex log) {
+    addSide("version " + *request.againstVersion, [&](LogIndex log) {
       return request.days.contains(table.day(log)) && isOfVersion(log);
     });
   }

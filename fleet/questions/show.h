@@ -42,6 +42,15 @@ struct ScalarSpread {
   std::array<std::int64_t, kPercents.size()> percentiles{};  ///< by the nearest rank
 };
 
+/// Of a distribution.
+struct MergedAnswer {
+  /// Mean and squared deviations are of the logs that have them, and not-a-number when none has,
+  /// when these are of too few devices, or when the count does not fit.
+  FiveNumbers numbers;
+  std::optional<double> deviation;  ///< the standard deviation; nothing without a mean
+  std::size_t logsWithoutMean = 0;  ///< whose mean or deviations are not finite
+};
+
 struct HistogramAnswer {
   std::uint64_t values = 0;
   std::vector<Piece> pieces;  ///< empty when there is none to show
@@ -52,16 +61,16 @@ struct HistogramAnswer {
 
 /// The answer for one set of logs.
 struct ShownSet {
-  std::string title;
+  PartName name;
   std::size_t logs = 0;
   std::size_t devices = 0;  ///< the largest number of its logs on one day
   std::optional<ScalarSpread> scalar;
-  std::optional<FiveNumbers> merged;
+  std::optional<MergedAnswer> merged;
   HistogramAnswer histogram;
 };
 
 struct ShowSide {
-  std::string title;
+  std::string title;     ///< days, "version X" or "all other versions"
   bool isShown = false;  ///< when not, it has too few devices, and the rest is empty
   ShownSet whole;
   std::vector<ShownSet> groups;

@@ -9,9 +9,9 @@ namespace tavrel::fleet {
 
 namespace {
 
-CountedGroup countedGroup(const Ledger& ledger, const std::string& title, const LogSet& logs) {
+CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogSet& logs) {
   const LogTable& table = ledger.table();
-  CountedGroup result{title, logs.logs(), logs.devices(table), 0, 0};
+  CountedGroup result{name, logs.logs(), logs.devices(table), 0, 0};
   const std::vector<std::size_t> counts = logs.logsByDay(table);
   bool isFirst = true;
   for (std::size_t i = 0; i < counts.size(); ++i) {
@@ -69,12 +69,12 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days) {
     if (!division.isShown) return answer;
     SummaryPart part{by, {}, division.joined};
     for (const Group& group : division.groups) {
-      part.groups.push_back(countedGroup(ledger, group.title, group.logs));
+      part.groups.push_back(countedGroup(ledger, group.name, group.logs));
     }
     answer.parts.push_back(std::move(part));
   }
   answer.isShown = true;
-  answer.whole = countedGroup(ledger, "all", logs);
+  answer.whole = countedGroup(ledger, {PartKind::kWhole}, logs);
   for (const Key& key : shownKeys(engine, ledger, days)) {
     std::size_t& count = key.kind == KeyKind::kScalar         ? answer.scalarKeys
                          : key.kind == KeyKind::kDistribution ? answer.distributionKeys

@@ -13,7 +13,7 @@
 namespace tavrel::fleet {
 
 struct CountedGroup {
-  std::string title;
+  PartName name;
   std::size_t logs = 0;
   std::size_t devices = 0;    ///< the largest number of its logs on one day
   std::int32_t firstDay = 0;  ///< with enough devices

@@ -47,17 +47,6 @@ class WideSum {
     }
   }
 
-  void add(const WideSum& other) {
-    for (std::size_t sign = 0; sign < 2; ++sign) {
-      Uint128 carry = 0;
-      for (std::size_t i = 0; i < kLimbs; ++i) {
-        carry += static_cast<Uint128>(sums_[sign][i]) + other.sums_[sign][i];
-        sums_[sign][i] = lowHalf(carry);
-        carry >>= 64;
-      }
-    }
-  }
-
   const Limbs& positive() const { return sums_[0]; }
   const Limbs& negative() const { return sums_[1]; }
 

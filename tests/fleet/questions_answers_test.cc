@@ -20,7 +20,7 @@ constexpr double kInfinity = std::numeric_limits<double>::infinity();
 std::vector<std::string> titles(const auto& groups) {
   std::vector<std::string> result;
   for (const auto& group : groups)
-    result.push_back(group.title + " " + std::to_string(group.devices) + "/" +
+    result.push_back(group.name.text() + " " + std::to_string(group.devices) + "/" +
                      std::to_string(group.logs));
   return result;
 }
@@ -77,24 +77,51 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
     if (device > 0) record.cells = {{"d", 5, 15, "(5, 15]", 2}};
   }
   fleet.add(1, "OS 1").distributions = {{"d", {}}};
+  fleet.add(1, "OS 1").distributions = {{"d", {2, 40, std::nan(""), std::nan(""), 1}}};
   const LogTable table(fleet.engine());
   Ledger ledger(table, 5);
   const ShowAnswer answer =
       show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
   const ShownSet& whole = answer.sides[0].whole;
-  EXPECT_EQ(whole.devices, 23u);
-  EXPECT_EQ(whole.merged->count, 86u);
-  EXPECT_EQ(whole.merged->maximum, 31);
-  EXPECT_EQ(whole.merged->mean, (4 * 190 + 60) / 86.0);
-  // The two devices above 20 are joined with their neighbours. The 6 values of the last three
+  EXPECT_EQ(whole.devices, 24u);
+  EXPECT_EQ(whole.merged->numbers.count, 87u);
+  EXPECT_EQ(whole.merged->numbers.maximum, 40);
+  EXPECT_EQ(whole.merged->numbers.mean, (4 * 190 + 60) / 86.0);
+  EXPECT_EQ(whole.merged->logsWithoutMean, 1u);
+  // The two devices above 20 are joined with their neighbours. The 7 values of the last four
   // devices may lie anywhere, with those of the smallest bucket.
   EXPECT_THAT(whole.histogram.pieces,
-              ElementsAre(Piece{-kInfinity, 10, 58, 86}, Piece{10, kInfinity, 0, 28}));
-  EXPECT_EQ(whole.histogram.values, 86u);
+              ElementsAre(Piece{-kInfinity, 10, 58, 87}, Piece{10, kInfinity, 0, 29}));
+  EXPECT_EQ(whole.histogram.values, 87u);
   EXPECT_THAT(
       whole.histogram.percentiles,
       ElementsAre(Interval{-kInfinity, 10}, Interval{-kInfinity, 10}, Interval{-kInfinity, 10},
                   Interval{-kInfinity, kInfinity}, Interval{-kInfinity, kInfinity}));
+}
+
+TEST(ShowTest, TellsNoMeanOfFewDevices) {
+  TestFleet fleet;
+  for (int device = 0; device < 30; ++device) {
+    const bool hasMean = device < 10 ? device < 4 : true;
+    const double mean = hasMean ? device : kInfinity;
+    fleet.add(1, device < 10   ? "OS 1"
+                 : device < 20 ? "OS 2"
+                               : "OS 3")
+        .distributions = {{"d", {0, kInfinity, mean, 0, 1}}};
+  }
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 5);
+  const ShowAnswer answer = show(fleet.engine(), ledger,
+                                 {.key = "d", .kind = KeyKind::kDistribution, .by = GroupBy::kOs});
+  const ShowSide& side = answer.sides[0];
+  EXPECT_EQ(side.whole.merged->numbers.mean, (6 + 145 + 245) / 24.0);
+  EXPECT_EQ(side.groups[1].merged->numbers.mean, 14.5);
+  // The second one without the first would tell of four devices.
+  for (const std::size_t group : {0u, 2u}) {
+    EXPECT_TRUE(std::isnan(side.groups[group].merged->numbers.mean));
+    EXPECT_EQ(side.groups[group].merged->deviation, std::nullopt);
+    EXPECT_EQ(side.groups[group].merged->numbers.count, 10u);
+  }
 }
 
 /// Whether all that can be computed from the shown sets is of enough devices: the logs that the
@@ -213,6 +240,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
       record.scalars.push_back({isNew ? "new" : "old", 1});
       record.distributions = {{"key8", {0, 1, noise(random) - (isNew ? 20 : 0), 5, 9}},
                               {"odd", {0, 0, std::nan(""), 0, 1}}};
+      if (device < 2) record.distributions[0].numbers.mean = std::nan("");
       if (device < 10) record.scalars.push_back({"rare", 1});
     }
   }
@@ -228,6 +256,8 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   EXPECT_EQ(answer.missing, 2u);
   EXPECT_EQ(answer.tooFew, 1u);
   EXPECT_EQ(answer.unfit, 1u);
+  EXPECT_EQ(answer.comparisons[1].after.logsWithoutMean, 3u);  // key8 of one device
+  EXPECT_EQ(answer.comparisons[1].after.logs, 297u);
   const Comparison& slower = answer.comparisons[2];
   EXPECT_NEAR(slower.difference, 9, 2);
   EXPECT_NEAR(*slower.effect, 0.9, 0.2);

@@ -20,12 +20,14 @@ struct Output {
   std::string error;
 };
 
-Output run(const std::string& database, std::vector<std::string> arguments) {
+Output run(const std::string& database, std::vector<std::string> arguments,
+           std::optional<std::size_t> columns = std::nullopt) {
   arguments.insert(arguments.begin(), {"--database", database});
   std::istringstream in;
   std::ostringstream out;
   std::ostringstream error;
-  const int status = runFleet(arguments, {in, out, error});
+  const int status =
+      runFleet(arguments, {.in = in, .out = out, .error = error, .columns = columns});
   return {status, out.str(), error.str()};
 }
 
@@ -44,12 +46,13 @@ std::vector<LogRecord> records() {
       LogRecord& record = all.emplace_back(makeRecord(all.size(), day));
       const bool isNew = device % 2 == 0;
       record.osVersion = isNew ? kNew : kOld;
-      record.region = device < 25 ? "DE" : device < 37 ? "AT" : "LI";
+      record.region = device < 13 ? "(other)" : device < 26 ? "" : device < 37 ? "AT" : "LI";
       record.whitelistDigest = isNew ? "b" : "a";
       record.scalars = {{"com.norvane.ioreport.nvme0.used_pct", static_cast<std::int64_t>(device)},
                         {"=sum", std::int64_t{1} << 60}};
       const double mean = 100 + 10 * noise(random) + (isNew ? 25 : 0);
-      record.distributions = {{kSlow, {mean - 50, mean + 50.1, mean, 1e4 / 3, 7}}};
+      record.distributions = {{kSlow, {mean - 50, mean + 50.1, mean, 1e4 / 3, 7}},
+                              {"=sum", {0, 1, device == 0 ? std::nan("") : mean, 1, 2}}};
       record.cells = {{kSlow, -kInfinity, 100, "(-inf, 100]", 4},
                       {kSlow, 100, kInfinity, "(100, inf)", 3}};
     }
@@ -65,7 +68,8 @@ const Question kQuestions[] = {
     {"summary", {"summary", "--json"}},
     {"keys", {"summary", "--keys", "--csv"}},
     {"distribution", {"show", kSlow, "--by", "os", "--json", "--days", "2"}},
-    {"scalar", {"show", "=sum", "--by", "region", "--csv"}},
+    {"both kinds", {"show", "=sum", "--by", "region", "--csv"}},
+    {"buckets", {"show", kSlow, "--by", "os", "--csv", "--buckets"}},
     {"against", {"show", kSlow, "--against", "4.10"}},
     {"days", {"show", kSlow, "--days", "2026-11-23..", "--against", "..2026-11-22", "--json"}},
     {"compare", {"compare", "4.9", "4.10", "--json"}},
@@ -119,7 +123,7 @@ TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
     answers.push_back(server.ask(sql, "fleet"));
   }
   EXPECT_EQ(answers[0].substr(0, answers[0].find('\n')), "2026-11-23 00:00:00\tOS 4.10 (B)\t20");
-  EXPECT_EQ(answers[1], "DE\t25\nAT\t12\n");
+  EXPECT_EQ(answers[1], "\t13\n(other)\t13\nAT\t11\n");
   EXPECT_THAT(answers[3], HasSubstr("OS 4.9 (A)\t20\t1152921504606846976\t"));
   EXPECT_EQ(answers[5], "(-inf, 100]\t320\n(100, inf)\t240\n");
   EXPECT_EQ(answers[6], "OS 4.10 (B)\t20\t20\t38\nOS 4.9 (A)\t20\t21\t39\n");
@@ -136,24 +140,73 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_EQ(first["before"]["devices"], 20);
   EXPECT_GT(first["lower"], 10);
   EXPECT_LT(first["upper"], 40);
-  EXPECT_EQ(compared["comparisons"][2]["effect"], 0);  // all are alike
+  EXPECT_EQ(compared["comparisons"][1]["after"]["logs_without_mean"], 3);
+  EXPECT_EQ(compared["comparisons"][3]["effect"], 0);  // all are alike
   const auto shown =
       nlohmann::json::parse(run(file, {"show", kSlow, "--by", "region", "--json"}).out);
   const auto& side = shown["answers"][0]["sides"][0];
-  EXPECT_EQ(side["joined"], 2);  // of AT and LI, 15 devices
-  EXPECT_EQ(side["groups"].size(), 2u);
+  std::string groups;
+  for (const auto& group : side["groups"])
+    groups += group["part"].dump() + group["group"].dump();
+  EXPECT_EQ(groups, R"x("not_told"null"value""(other)""other"null)x");
+  EXPECT_EQ(side["joined"], 2);  // of AT and LI, 14 devices
   EXPECT_EQ(side["all"]["values"], 840);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["above"], 100);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["at_most"], nullptr);
   EXPECT_THAT(run(file, {"compare", "4.9", "4.10"}).out,
-              HasSubstr("OS 4.9 (A) -> OS 4.10 (B), all days: 1 of 3 statistics changed\n"));
-  EXPECT_THAT(run(file, {"show", "=sum", "--csv"}).out,
-              HasSubstr("\r\n'=sum,scalar,all days,,40,120,120,1152921504606846976,"));
+              HasSubstr("OS 4.9 (A) -> OS 4.10 (B), all days: 2 of 4 statistics changed\n"));
+  const std::string csv = run(file, {"show", "=sum", "--by", "region", "--csv"}).out;
+  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,scalar,all days,all,,40,120,0,120,1152921504606846976,"
+                             "1152921504606846976,1152921504606846976,0,0,1152921504606846976,,,"));
+  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,value,(other),13,39,3,78,0,1,"));
+  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,not_told,,13,39,0,78,"));
+  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,other,,14,42,0,84,"));
+  const std::string buckets = run(file, {"show", kSlow, "--csv", "--buckets", "--by", "os"}).out;
+  EXPECT_THAT(buckets, HasSubstr(",all days,all,,,100,480,480\r\n"));
+  EXPECT_THAT(buckets, HasSubstr(",all days,value,OS 4.10 (B),100,,180,180\r\n"));
 
   const std::string page = run(file, {"page", "-o", "-"}).out;
-  EXPECT_THAT(page, HasSubstr("1 of 3 statistics changed"));
+  EXPECT_THAT(page, HasSubstr("2 of 4 statistics changed"));
   EXPECT_THAT(page, HasSubstr("Endurance used"));
   EXPECT_EQ(page.find("<script"), std::string::npos);
+}
+
+TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
+  load(file, 1);
+  const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 60).out;
+  EXPECT_THAT(shown, HasSubstr("\n              DEVICES  MINIMUM        MEAN  MAXIMUM  NO MEAN\n"
+                               "  (all)            40  "));
+  EXPECT_THAT(shown, HasSubstr("\n  \"(other)\"        13  "));
+  EXPECT_THAT(shown, HasSubstr("\n  (not told)       13  "));
+  EXPECT_THAT(shown, HasSubstr("\n  No room for STD DEVIATION, LOGS, VALUES, 25 %, 75 %, MINIMUM, "
+                               "MAXIMUM, 5 %, 95 %: widen the terminal\n"));
+  EXPECT_THAT(shown, HasSubstr("\n  NO MEAN counts logs that means and deviations leave out"));
+  const std::string compared = run(file, {"compare", "4.9", "4.10", "--all"}, 80).out;
+  EXPECT_THAT(compared, HasSubstr("\n=sum  "));
+  EXPECT_THAT(compared, HasSubstr("  scalar  "));
+  EXPECT_EQ(compared.find("…"), std::string::npos);
+}
+
+TEST_F(QuestionCommands, CompleteInBash) {
+  load(file, 1);
+  const std::string folder = root.root.path("");
+  root.write("/versions", run(file, {"completion", "versions"}).out);
+  const std::string script = run(file, {"completion", "bash"}).out +
+                             "tavrel-fleet() { echo \"$@\" > " + folder + "/asked; cat " + folder +
+                             "/versions; }\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrel_fleet\n"
+                             "echo \"${COMPREPLY[@]}\"\n";
+  const std::pair<std::string, const char*> cases[] = {
+      {"''", "load summary show compare page\n"},
+      {"compare ''", "4.9 4.10\n"},
+      {"show x --by r", "region\n"},
+      {"page --d", "--days --devices-at-least --database\n"},
+      {"--database x compare 4.9 4.1", "4.10\n"}};
+  for (const auto& [line, words] : cases) {
+    root.write("/script", "COMP_WORDS=(tavrel-fleet " + line + ")\n" + script);
+    EXPECT_EQ(std::system(("bash " + folder + "/script > " + folder + "/words").c_str()), 0);
+    EXPECT_EQ(contentOf(folder + "/words"), words) << line;
+  }
+  EXPECT_EQ(contentOf(folder + "/asked"), "--database x completion versions\n");
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
@@ -193,6 +246,18 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   }
   EXPECT_EQ(run(file, {"summary", "--devices-at-least", "41"}).out,
             "All logs: fewer than 41 devices: nothing is shown\n");
+  for (const auto& [where, message] :
+       {std::pair("http://h/d",
+                  "no database has an address that begins with \"http://\": write "
+                  "clickhouse:// for a server; ./http://… is a file"),
+        {"clickhouse://h/d?a=b",
+         "the database's address has the unknown option \"a\": write "
+         "clickhouse://[USER@]HOST[:PORT]/DATABASE[?cluster=NAME]"}}) {
+    const Output output = run(where, {"summary"});
+    EXPECT_EQ(output.error, "tavrel-fleet: --database: " + std::string(message) +
+                                ": see 'tavrel-fleet summary --help'\n");
+    EXPECT_EQ(output.status, 2);
+  }
   const std::string empty = root.root.path("/empty.db");
   openEngine(empty, OpenMode::kWrite);
   EXPECT_EQ(run(empty, {"summary"}).error,

@@ -93,12 +93,33 @@ void Table::add(std::vector<Cell> cells) {
   rows_.push_back(std::move(cells));
 }
 
+std::size_t Table::textWidth(std::size_t column) const {
+  std::size_t width = displayWidth(columns_[column].title);
+  for (const auto& row : rows_)
+    width = std::max(width, displayWidth(row[column].text));
+  return width;
+}
+
+void Table::leaveOutColumns(std::size_t room) {
+  std::size_t taken = indent_;
+  for (std::size_t i = 0; i < columns_.size(); ++i)
+    taken += (i == 0 ? 0 : kGap.size()) + textWidth(i);
+  while (taken > room) {
+    const auto least = std::ranges::max_element(columns_, {}, &Column::rank);
+    if (least->rank == 0) return;
+    const auto index = least - columns_.begin();
+    taken -= kGap.size() + textWidth(static_cast<std::size_t>(index));
+    leftOut_ += (leftOut_.empty() ? "" : ", ") + least->title;
+    columns_.erase(least);
+    for (auto& row : rows_)
+      row.erase(row.begin() + index);
+  }
+}
+
 std::vector<std::size_t> Table::widths(const Page& page) const {
   std::vector<std::size_t> widths;
   for (std::size_t i = 0; i < columns_.size(); ++i) {
-    std::size_t width = displayWidth(columns_[i].title);
-    for (const auto& row : rows_)
-      width = std::max(width, displayWidth(row[i].text));
+    const std::size_t width = textWidth(i);
     widths.push_back(page.columns ? width : std::min(width, kWidestPadding));
   }
   const std::size_t taken =
@@ -148,8 +169,9 @@ void Table::printRow(const Page& page, const std::vector<Cell>& row,
   page.out << line << '\n';
 }
 
-void Table::print(const Page& page) const {
+void Table::print(const Page& page) {
   if (columns_.empty()) return;
+  if (page.columns) leaveOutColumns(*page.columns);
   const std::vector<std::size_t> all = widths(page);
   std::vector<Cell> titles;
   bool hasTitles = false;
@@ -160,6 +182,8 @@ void Table::print(const Page& page) const {
   if (hasTitles) printRow(page, titles, all);
   for (const auto& row : rows_)
     printRow(page, row, all);
+  if (!leftOut_.empty())
+    page.out << std::string(indent_, ' ') << "No room for " << leftOut_ << ": widen the terminal\n";
 }
 
 }  // namespace tavrel

@@ -31,6 +31,9 @@ class Table {
   struct Column {
     std::string title;
     Align align = Align::Left;
+    /// On a terminal too narrow for all columns, those with the highest rank are left out first;
+    /// those with 0 stay.
+    unsigned rank = 0;
   };
   struct Cell {
     Cell(const char* cellText) : text(cellText) {}
@@ -52,12 +55,15 @@ class Table {
   void add(std::vector<Cell> cells);
   bool empty() const { return rows_.empty(); }
 
-  /// On a terminal the widest column of left-aligned text is cut ("…") as far as needed to fit;
-  /// elsewhere cells are whole, and long ones push the rest of their row aside. Bars take the
-  /// columns that are left. Titles that are all empty are not printed.
-  void print(const Page& page) const;
+  /// On a terminal columns with a rank are left out as far as needed to fit, which a line below
+  /// says, and then the widest column of left-aligned text is cut ("…"); elsewhere all columns are
+  /// there, cells are whole, and long ones push the rest of their row aside. Bars take the columns
+  /// that are left. Titles that are all empty are not printed.
+  void print(const Page& page);
 
  private:
+  std::size_t textWidth(std::size_t column) const;
+  void leaveOutColumns(std::size_t room);
   std::vector<std::size_t> widths(const Page& page) const;
   void printRow(const Page& page, const std::vector<Cell>& row,
                 const std::vector<std::size_t>& widths) const;
@@ -65,6 +71,7 @@ class Table {
   std::vector<Column> columns_;
   std::vector<std::vector<Cell>> rows_;
   std::size_t indent_;
+  std::string leftOut_;  // titles of columns
 };
 
 }  // namespace tavrel

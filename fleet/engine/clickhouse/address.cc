@@ -84,7 +84,7 @@ void readOptions(ServerAddress& address, std::string_view query) {
       checkName("cluster", value);
       address.cluster = value;
     } else if (name == "password-file") {
-      address.password = passwordIn(value);
+      address.passwordFile = value;
     } else if (name == "ca-file") {
       address.authorityFile = value;
     } else if (name == "timeout") {
@@ -125,6 +125,12 @@ ServerAddress parseServerAddress(std::string_view text) {
   address.user = part(url.get(), CURLUPART_USER);
   address.password = part(url.get(), CURLUPART_PASSWORD);
   readOptions(address, part(url.get(), CURLUPART_QUERY, 0));
+  return address;
+}
+
+ServerAddress readServerAddress(std::string_view text) {
+  ServerAddress address = parseServerAddress(text);
+  if (!address.passwordFile.empty()) address.password = passwordIn(address.passwordFile);
   if (address.user.empty() && !address.password.empty()) address.user = "default";
   return address;
 }

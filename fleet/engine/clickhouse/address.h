@@ -12,6 +12,7 @@ struct ServerAddress {
   std::string url;   ///< of its HTTP interface, with a slash at the end
   std::string user;
   std::string password;
+  std::string passwordFile;   ///< has the password; empty without
   std::string authorityFile;  ///< trusted in place of the system's authorities; empty without
   std::string database;
   std::string cluster;                ///< empty without
@@ -23,7 +24,11 @@ struct ServerAddress {
 bool isServerAddress(std::string_view text);
 
 /// clickhouse[s]://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], with the options
-/// "cluster", "password-file", "ca-file", "timeout" (in seconds) and "retries". Throws EngineError.
+/// "cluster", "password-file", "ca-file", "timeout" (in seconds) and "retries". Looks at the text
+/// only. Throws EngineError.
 ServerAddress parseServerAddress(std::string_view text);
+
+/// The same with the password from its file. Throws EngineError.
+ServerAddress readServerAddress(std::string_view text);
 
 }  // namespace tavrel::fleet

@@ -44,7 +44,7 @@ class ClickhouseEngine final : public Engine {
 }  // namespace
 
 std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, bool writes) {
-  return std::make_unique<ClickhouseEngine>(parseServerAddress(address), writes);
+  return std::make_unique<ClickhouseEngine>(readServerAddress(address), writes);
 }
 
 }  // namespace tavrel::fleet

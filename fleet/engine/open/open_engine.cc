@@ -8,6 +8,22 @@
 
 namespace tavrel::fleet {
 
+std::string databaseFault(const std::string& where) {
+  if (where.empty()) return "names no file";
+  if (!isServerAddress(where)) {
+    const std::size_t scheme = where.find("://");
+    if (scheme == where.npos || where.find('/') < scheme) return "";
+    return "no database has an address that begins with \"" + where.substr(0, scheme + 3) +
+           "\": write clickhouse:// for a server; ./" + where.substr(0, scheme + 3) + "… is a file";
+  }
+  try {
+    parseServerAddress(where);
+  } catch (const EngineError& error) {
+    return error.what();
+  }
+  return "";
+}
+
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode) {
   const bool writes = mode == OpenMode::kWrite;
   if (isServerAddress(where)) return openClickhouseEngine(where, writes);

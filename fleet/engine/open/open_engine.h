@@ -3,6 +3,7 @@
 
 #include <cstdint>
 #include <memory>
+#include <string>
 #include <string_view>
 
 #include "fleet/engine/engine.h"
@@ -13,6 +14,10 @@ enum class OpenMode : std::uint8_t {
   kRead,   ///< the database must be there
   kWrite,  ///< makes it, or its tables, where they are missing
 };
+
+/// What is wrong with the text that names a database, in words; empty when nothing is. Looks at the
+/// text only.
+std::string databaseFault(const std::string& where);
 
 /// `where` is the path of an SQLite file, or the address of a database on a ClickHouse server:
 /// clickhouse://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], clickhouses:// over TLS.

@@ -1,0 +1,79 @@
+#include "fleet/commands/completion_command.h"
+
+#include <algorithm>
+#include <memory>
+#include <optional>
+#include <ostream>
+#include <string>
+
+#include "fleet/commands/question.h"
+#include "fleet/questions/grouping.h"
+#include "tools/completion/scripts/completion_script.h"
+
+namespace tavrel::fleet {
+namespace {
+
+/// Names go to shells: only those that need no quoting.
+bool isPlain(std::string_view word) {
+  return !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
+    return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
+           (character >= '0' && character <= '9') ||
+           std::string_view("._-+/@%,").find(character) != std::string_view::npos;
+  });
+}
+
+/// The first word of the version that names it.
+std::optional<std::string> wordFor(const Question& question, std::string_view version) {
+  while (!version.empty()) {
+    const std::string word(version.substr(0, version.find(' ')));
+    version.remove_prefix(std::min(version.size(), word.size() + 1));
+    try {
+      if (isPlain(word)) {
+        question.readVersion(word);
+        return word;
+      }
+    } catch (const std::runtime_error&) {
+      // Other versions have it, too.
+    }
+  }
+  return std::nullopt;
+}
+
+void listVersions(FleetContext& context) {
+  Question question(context, {});
+  const LogTable& table = question.table();
+  LogSet all(table);
+  for (LogIndex log = 0; log < table.size(); ++log)
+    all.insert(log);
+  const std::size_t least = question.ledger().devicesAtLeast();
+  for (const Group& group : groupsOf(table, all, GroupBy::kOs, least)) {
+    if (!group.name.isValue() || !question.ledger().hasEnough(group.logs)) continue;
+    if (const auto word = wordFor(question, group.name.value)) context.out() << *word << '\n';
+  }
+}
+
+CompletedProgram completedProgram(const Command& program) {
+  return {.model = modelOf(program),
+          .anywhere = "--database",
+          .lists = {{"OLD", "versions"}, {"NEW", "versions"}, {"DAYS|VERSION", "versions"}}};
+}
+
+}  // namespace
+
+void addCompletionCommand(Command top, FleetContext& context) {
+  const auto what = std::make_shared<std::string>();
+  const Command command = top.addCommand("completion", "Print what shells complete");
+  command.hide();
+  command.addOption("WHAT", *what, "A shell, or a list")
+      .required()
+      .oneOf({"bash", "zsh", "fish", "versions"});
+  command.onRun([&context, what, top] {
+    if (*what == "versions") return listVersions(context);
+    const CompletedProgram program = completedProgram(top);
+    context.out() << (*what == "bash"  ? bashScript(program)
+                      : *what == "zsh" ? zshScript(program)
+                                       : fishScript(program));
+  });
+}
+
+}  // namespace tavrel::fleet

@@ -1,0 +1,26 @@
+// What the parts of a set of logs are called, so that no text in a log can pass for a name of ours.
+#pragma once
+
+#include <cstdint>
+#include <string>
+
+namespace tavrel::fleet {
+
+enum class PartKind : std::uint8_t {
+  kWhole,
+  kValue,    ///< the logs with one value of an attribute
+  kNotTold,  ///< the logs that do not say it
+  kOther,    ///< those of several values, none of which may be shown by itself
+};
+
+struct PartName {
+  PartKind kind = PartKind::kWhole;
+  std::string value = {};  ///< empty unless the kind is kValue
+
+  bool isValue() const { return kind == PartKind::kValue; }
+  /// For people: "(all)", "(not told)", "(other)", or the value, in quotation marks when it begins
+  /// with a parenthesis or a quotation mark.
+  std::string text() const;
+};
+
+}  // namespace tavrel::fleet
