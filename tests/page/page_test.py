@@ -5,46 +5,16 @@
 """
 
 import os
-import re
 import sys
 import tempfile
 
 from browser import Browser
-from device import LONG, OVERRIDE, SCRIPT, Device
-
-HERE = os.path.dirname(os.path.abspath(__file__))
-WIDTHS = (320, 768, 1920)
-
-with open(os.path.join(HERE, "inspect.js"), encoding="utf-8") as source:
-    INSPECT = source.read()
-
-# What turns the direction of text is visible.
-TURNED = re.sub("[\u202e\u202c\u2067]", "\ufffd", OVERRIDE)
+from device import LONG, SCRIPT, Device
+from inspection import TURNED, expect, inspect
 
 # The cells of a scalar by its key.
 ROWS = """Object.fromEntries([...document.querySelectorAll('table[aria-label=Scalars] tbody tr')].map(
     row => [row.querySelector('bdi').textContent, [...row.cells].slice(1).map(c => c.textContent)]))"""
-
-
-def expect(actual, expected, what):
-    if actual != expected:
-        raise AssertionError(f"{what}: {actual!r}, expected {expected!r}")
-
-
-def inspect(browser, file, charts):
-    """Faults at all widths in both colour schemes. `charts` is how many there are."""
-    for width in WIDTHS:
-        for scheme in ("light", "dark"):
-            what = f"{os.path.basename(file)}, {width} pixels, {scheme}"
-            browser.open(file, width, scheme)
-            expect(browser.evaluate(INSPECT), [], what)
-            requests = [event["params"]["request"]["url"] for event in browser.events
-                        if event.get("method") == "Network.requestWillBeSent"]
-            expect(requests, ["file://" + file], what + ": requests")
-    nodes = browser.call("Accessibility.getFullAXTree")["nodes"]
-    names = [node["name"]["value"] for node in nodes
-             if not node["ignored"] and node["role"]["value"] in ("img", "image")]
-    expect((len(names), [name for name in names if ": " not in name]), (charts, []), "named charts")
 
 
 def check_content(browser):
