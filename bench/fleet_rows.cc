@@ -1,14 +1,17 @@
 // Fills and reads a fleet's database, and tells how long that took.
 //
-//   tavrel_fleet_rows append DATABASE LOGS [AT_ONCE]   files logs of 300 rows
-//   tavrel_fleet_rows floor FILE LOGS [AT_ONCE]        inserts as many rows with plain SQLite
-//   tavrel_fleet_rows scan DATABASE [READERS]          reads all scalars and distributions
+//   tavrel_fleet_rows append DATABASE LOGS [AT_ONCE [SCALARS DISTRIBUTIONS]]
+//                                                  files logs, of 300 rows unless told
+//   tavrel_fleet_rows floor FILE LOGS [AT_ONCE]    inserts as many rows with plain SQLite
+//   tavrel_fleet_rows scan DATABASE [READERS]      reads all scalars and distributions
+//   tavrel_fleet_rows merge DATABASE TIMES         merges the logs of the first distribution
 //
 // Prints: what, logs or rows, seconds of the clock, seconds of the processors.
 #include <algorithm>
 #include <atomic>
 #include <chrono>
 #include <cstdio>
+#include <cstdlib>
 #include <cstring>
 #include <ctime>
 #include <limits>
@@ -18,6 +21,7 @@
 #include <vector>
 
 #include "fleet/engine/open/open_engine.h"
+#include "fleet/questions/merged_numbers.h"
 
 using namespace tavrel::fleet;
 
@@ -56,10 +60,10 @@ class Watch {
 // Logs with numbers that look drawn by lot and are always the same.
 class Logs {
  public:
-  Logs() {
-    for (std::size_t i = 0; i < kScalars; ++i)
+  explicit Logs(std::size_t scalars = kScalars, std::size_t distributions = kDistributions) {
+    for (std::size_t i = 0; i < scalars; ++i)
       scalars_.push_back("com.example.component.counter_of_something." + std::to_string(i));
-    for (std::size_t i = 0; i < kDistributions; ++i)
+    for (std::size_t i = 0; i < distributions; ++i)
       distributions_.push_back("com.example.component.series_of_something." + std::to_string(i));
     for (std::size_t i = 0; i < kBuckets; ++i)
       labels_.push_back("(" + std::to_string(i * 10) + ", " + std::to_string(i * 10 + 10) + "]");
@@ -107,9 +111,8 @@ class Logs {
   std::uint64_t state_ = 88172645463325252;
 };
 
-void append(const char* where, std::size_t count, std::size_t atOnce) {
+void append(const char* where, std::size_t count, std::size_t atOnce, Logs logs) {
   Watch watch;
-  Logs logs;
   const auto engine = openEngine(where, OpenMode::kWrite);
   std::size_t added = 0;
   for (std::size_t first = 0; first < count; first += atOnce) {
@@ -222,6 +225,29 @@ void scan(const char* where, std::size_t readers) {
   watch.print("scan", rows);
 }
 
+// As `show` does it, after the table of logs was read. The same bits each time, or status 1.
+void merge(const char* where, std::size_t times) {
+  Watch watch;
+  const auto engine = openEngine(where, OpenMode::kRead);
+  std::string key;
+  for (const Key& one : engine->keys())
+    if (key.empty() && one.kind == KeyKind::kDistribution) key = one.name;
+  double mean = 0;
+  for (std::size_t i = 0; i < times; ++i) {
+    watch.start();
+    MergedNumbers merged;
+    engine->distributions(key, [&](std::span<const DistributionValue> rows) {
+      for (const DistributionValue& row : rows)
+        merged.add(row.numbers);
+    });
+    const FiveNumbers numbers = merged.numbers();
+    watch.stop();
+    if (i != 0 && numbers.mean != mean) std::exit(1);
+    mean = numbers.mean;
+  }
+  watch.print("merge", times);
+}
+
 }  // namespace
 
 int main(int count, char** arguments) {
@@ -230,11 +256,14 @@ int main(int count, char** arguments) {
     return index < count ? std::stoul(arguments[index]) : otherwise;
   };
   if (what == "append") {
-    append(arguments[2], number(3, 10'000), number(4, 1000));
+    append(arguments[2], number(3, 10'000), number(4, 1000),
+           Logs(number(5, kScalars), number(6, kDistributions)));
   } else if (what == "floor") {
     insertRows(arguments[2], number(3, 10'000), number(4, 1000));
   } else if (what == "scan") {
     scan(arguments[2], number(3, 1));
+  } else if (what == "merge") {
+    merge(arguments[2], number(3, 1));
   } else {
     return 2;
   }

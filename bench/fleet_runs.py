@@ -4,7 +4,7 @@ the same files, in one process.
 
     bench/fleet_runs.py BIN_DIRECTORY [LOGS]
 
-Each log has 200 scalars, 70 distributions and 30 histograms. A second load of ten times as many
+Each log has 300 rows: 220 scalars, 30 distributions and 10 histograms of 5 buckets. A second load of ten times as many
 shows how the time of a log grows. The run fails unless each log is in the table.
 """
 
@@ -32,7 +32,7 @@ MARK = 987654321
 
 
 def histogram(values):
-    bounds = [5, 10, 25, 50, 100, 150]
+    bounds = [40, 80, 120, 160]
     counts = {}
     for value in values:
         place = next((i for i, bound in enumerate(bounds) if value <= bound), len(bounds))
@@ -45,16 +45,16 @@ def histogram(values):
 def log_text(numbers):
     """A log in which MARK stands for the value that tells logs apart."""
     scalars = {f"com.example.usage.scalar.{key:04}": numbers.randrange(1000) * 10
-               for key in range(200)}
+               for key in range(220)}
     scalars[STARTS] = MARK
     distributions, histograms = {}, {}
-    for key in range(70):
-        values = [numbers.uniform(0, 200) for _ in range(numbers.randrange(20, 400))]
+    for key in range(30):
+        values = [numbers.uniform(0, 200) for _ in range(numbers.randrange(100, 400))]
         mean = statistics.fmean(values)
         name = f"com.example.timing.distribution.{key:03}"
         distributions[name] = [min(values), max(values), mean,
                                sum((value - mean) ** 2 for value in values), len(values)]
-        if key < 30:
+        if key < 10:
             histograms[name] = histogram(values)
     day = datetime.datetime(2026, 11, 24) + datetime.timedelta(days=numbers.randrange(30))
     text = plistlib.dumps({
