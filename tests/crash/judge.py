@@ -1,0 +1,172 @@
+#!/usr/bin/env python3
+"""Mounts states that a power cut could have left, and checks each.
+
+    judge.py FILE-SYSTEM PROGRAMS RECORDING DAY [--states N] [--seconds N] [--seed N] [--state N]
+
+State numbers begin with the points after each flush, FUA write and step; the others are torn. Ends
+with 1 when a state breaks a promise.
+"""
+
+import argparse
+import bisect
+import collections
+import pathlib
+import random
+import shutil
+import subprocess
+import sys
+import tempfile
+import time
+
+from contents import tree_digest
+from days import Device, steps
+from file_systems import KINDS, Loop, call, mount, mount_in_private, unmount
+from verdict import Undisturbed
+from write_log import FLUSH, FUA, MARK, Image, WriteLog
+
+ROUND = 500  # states that are made in one pass over the log
+State = collections.namedtuple("State", "number position cut")
+
+
+class Judge:
+    def __init__(self, options, work):
+        self.options, self.work, self.kind = options, work, KINDS[options.kind]
+        self.log = WriteLog(options.recording / "writes")
+        self.steps = steps(options.day)
+        call("cc", "-O1", "-shared", "-fPIC", "-o", str(work / "preload.so"),
+             str(pathlib.Path(__file__).parent / "preload.c"))
+        for folder in ("undisturbed", "device"):
+            (work / folder).mkdir()
+        self.device = Device(work / "device", options.programs, work / "preload.so")
+        self.undisturbed = Undisturbed(
+            options.recording / "after", work, self.steps,
+            Device(work / "undisturbed", options.programs, work / "preload.so"))
+        self.image = (work / "image").open("w+b")
+        self.seen = {}  # verdicts by step and content
+        self.judged = collections.Counter()
+        self.failures = 0
+        self.find_points()
+
+    def find_points(self):
+        """Positions in the log: where all before is durable, and the windows between flushes."""
+        self.marks, self.points, flushes = [], [], []
+        for number, entry in enumerate(self.log.entries):
+            if entry.flags & MARK:
+                self.marks.append((number, entry.data.split(":")))
+            if self.marks:
+                if entry.flags & FLUSH:
+                    flushes.append(number)
+                self.points += [number] if entry.flags & (FLUSH | MARK) else []
+                self.points += [number + 1] if entry.flags & FUA else []
+        self.points = sorted(set(self.points + [len(self.log.entries)]))
+        ends = flushes[1:] + [len(self.log.entries)]
+        self.windows = [(start, end) for start, end in zip(flushes, ends)
+                        if any(entry.length for entry in self.log.entries[start:end])]
+        self.weights = [end - start for start, end in self.windows]
+
+    def state(self, number):
+        if number < len(self.points):
+            return State(number, self.points[number], None)
+        choice = random.Random(f"{self.options.seed} {number}")
+        start, end = choice.choices(self.windows, self.weights)[0]
+        return State(number, start, choice.randint(start + 1, end))
+
+    def where(self, position):
+        """The step in which the cut came, and the logs that the server had confirmed."""
+        before = [words for place, words in self.marks[:bisect.bisect_left(
+            self.marks, (position, []))]]
+        done = [int(words[1]) for words in before if words[0] == "step"]
+        received = frozenset(words[1] for words in before if words[0] == "received")
+        return min((done[-1] if done else 0) + 1, len(self.steps)), received
+
+    def judge(self, state):
+        self.image_of(state)
+        number, received = self.where(state.cut or state.position)
+        loop = Loop(self.image)
+        try:
+            mount(loop.path, self.device.root, self.kind)
+            try:
+                digest = number, received, tree_digest(self.device.root)
+                self.judged["mounted"] += 1
+                if digest in self.seen:
+                    return number, self.seen[digest]
+                fault = self.undisturbed.fault(self.device, number, received)
+            finally:
+                unmount(self.device.root)
+        except OSError as error:
+            return number, f"the file system: {error}"
+        finally:
+            loop.close()
+        self.judged["ran"] += 1
+        checked = subprocess.run([*self.kind.check, self.work / "image"], capture_output=True,
+                                 text=True, check=False)
+        if checked.returncode and not fault:
+            fault = f"{self.kind.check[0]}: {checked.stdout[-300:]}"
+        self.seen[digest] = fault
+        return number, fault
+
+    def image_of(self, state):
+        image = self.disk
+        image.advance(state.position)
+        if state.cut is not None:
+            image.torn(state.cut, random.Random(f"{self.options.seed} {state.number} torn"),
+                       self.kind.atom)
+        image.write(self.image)
+        if state.cut is not None:
+            image.mend()
+
+    def judge_all(self):
+        deadline = time.monotonic() + self.options.seconds
+        numbers = ([self.options.state] if self.options.state is not None
+                   else range(self.options.first, self.options.states))
+        told = 0
+        for start in range(0, len(numbers), ROUND):
+            self.disk = Image(self.log, self.kind.size)
+            chosen = [self.state(number) for number in numbers[start:start + ROUND]]
+            for state in sorted(chosen, key=lambda each: each.position):
+                if time.monotonic() > deadline:
+                    return
+                number, fault = self.judge(state)
+                self.judged["states"] += 1
+                self.judged["points" if state.cut is None else "torn"] += 1
+                if fault:
+                    self.failures += 1
+                    print(f"{self.options.kind}: state {state.number}, in "
+                          f"'{self.steps[number - 1].name}': {fault}: look at it with "
+                          f"script/crash-test --file-system {self.options.kind} --again "
+                          f"--seed {self.options.seed} --state {state.number}", flush=True)
+                if self.judged["states"] // 100 != told:
+                    told = self.judged["states"] // 100
+                    print(self.summary(), flush=True)
+
+    def summary(self):
+        return (f"{self.options.kind}: {self.judged['states']} states ({self.judged['points']} "
+                f"points of {len(self.points)}, {self.judged['torn']} torn), of "
+                f"{self.judged['ran']} different contents, {self.failures} broken")
+
+
+def main():
+    parser = argparse.ArgumentParser()
+    parser.add_argument("kind", choices=KINDS)
+    parser.add_argument("programs", type=pathlib.Path)
+    parser.add_argument("recording", type=pathlib.Path)
+    parser.add_argument("day", type=int)
+    parser.add_argument("--first", type=int, default=0)
+    parser.add_argument("--states", type=int, default=2000)
+    parser.add_argument("--seconds", type=float, default=1e9)
+    parser.add_argument("--seed", type=int, default=1)
+    parser.add_argument("--state", type=int)
+    options = parser.parse_args()
+    mount_in_private()
+    work = pathlib.Path(tempfile.mkdtemp(prefix="tavrel_crash.", dir="/dev/shm"))
+    try:
+        judge = Judge(options, work)
+        judge.judge_all()
+    finally:
+        shutil.rmtree(work)
+    print(judge.summary(), flush=True)
+    sys.exit(judge.failures > 0)
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,64 @@
+#!/usr/bin/env python3
+"""Runs in a guest: plays the two days on a file system and records what its block device is given.
+
+    record.py FILE-SYSTEM PROGRAMS DAY
+
+The log of writes goes to the disk /dev/vda; as a tar file, the device after each step to /dev/vdb.
+"""
+
+import pathlib
+import shutil
+import subprocess
+import sys
+
+from days import Device, Server, prepare, steps
+from file_systems import KINDS, Loop, call, mount, unmount
+
+WORK = pathlib.Path("/dev/shm/crash")
+NAME = "crash"
+
+
+def mark(text):
+    call("dmsetup", "message", NAME, "0", f"mark {text}")
+
+
+def main():
+    kind, programs, day = KINDS[sys.argv[1]], sys.argv[2], int(sys.argv[3])
+    root = WORK / "device"
+    root.mkdir(parents=True)
+    call("cc", "-O1", "-shared", "-fPIC", "-o", str(WORK / "preload.so"),
+         str(pathlib.Path(__file__).parent / "preload.c"))
+    # Written back soon, so that much reaches the device in another order than it was written.
+    for name, value in (("dirty_writeback_centisecs", 10), ("dirty_expire_centisecs", 20)):
+        pathlib.Path("/proc/sys/vm", name).write_text(str(value), encoding="ascii")
+    with open(WORK / "data", "w+b") as file:
+        file.truncate(kind.size)
+        loop = Loop(file)
+    call("dmsetup", "create", "--noudevrules", "--noudevsync", NAME, "--table",
+         f"0 {kind.size // 512} log-writes {loop.path} /dev/vda")
+    path = "/dev/dm-0"  # there is no udev to give it a name
+    call(*kind.make, path)
+    mount(path, root, kind)
+
+    server = Server(lambda name: mark(f"received:{name}"))
+    server.start()
+    device = Device(root, programs, WORK / "preload.so")
+    prepare(device, day, server.url)
+    call("sync")
+    shutil.copytree(root, WORK / "after/0", symlinks=True)
+    mark("step:0")
+    for number, step in enumerate(steps(day), 1):
+        device.clock = step.clock
+        step.action(device)
+        mark(f"step:{number}")
+        print(f"recorded: {step.name}", flush=True)
+        shutil.copytree(root, WORK / f"after/{number}", symlinks=True)
+    unmount(root)
+    call("dmsetup", "remove", NAME)
+    loop.close()
+    subprocess.run(["tar", "--create", "--file", "/dev/vdb", "--directory", WORK, "after"],
+                   check=True)
+
+
+if __name__ == "__main__":
+    main()

@@ -1,0 +1,194 @@
+#!/usr/bin/env python3
+"""Runs in a guest: plays the two days on UBIFS, on a partition of a simulated NAND chip. The device
+is stopped before and after calls that a file system must keep in order; what the chip then holds is
+what a power cut would leave. It is written to another partition, mounted and checked there.
+
+    ubifs.py PROGRAMS DAY STATES SECONDS SEED
+
+Ends with 1 when a state breaks a promise.
+"""
+
+import os
+import pathlib
+import random
+import shutil
+import signal
+import subprocess
+import sys
+import time
+
+from contents import tree_digest
+from days import Device, Server, prepare, steps
+from file_systems import Kind, call, mount, unmount
+from verdict import Undisturbed
+
+WORK = pathlib.Path("/dev/shm/crash")
+# A chip of 128 MiB with pages of 2 KiB; of it, a partition for the device and one for the states.
+CHIP = ["first_id_byte=0xec", "second_id_byte=0xa1", "third_id_byte=0x00", "fourth_id_byte=0x15"]
+BLOCKS = 120
+BLOCK, RAW_BLOCK = 1 << 17, 64 * (2048 + 64)
+ERASED = b"\xff" * RAW_BLOCK
+KIND = Kind("ubifs", [], "", 0, 0, [])
+VOLUME = "crash"
+SHARE = 0.6  # of the stops at which the chip is read
+SUDDEN = 0.2  # of the stops that are followed by one at a random moment
+LONGEST_RUN = 0.02  # seconds until that
+
+
+class Chip:
+    """Contents of a partition, spare bytes included. Blocks of equal content are kept once."""
+
+    def __init__(self):
+        self.blocks = {}
+
+    def read(self, partition):
+        raw = subprocess.run(["nanddump", "--quiet", "--noecc", "--oob", f"/dev/mtd{partition}"],
+                             check=True, capture_output=True).stdout
+        names = []
+        for start in range(0, len(raw), RAW_BLOCK):
+            block = raw[start:start + RAW_BLOCK]
+            name = hash(block) if block != ERASED else None
+            if name is not None:
+                self.blocks.setdefault(name, block)
+            names.append(name)
+        return names
+
+    def read_at_rest(self, partition):
+        """The file system may just be writing what it keeps in memory for some seconds."""
+        names = self.read(partition)
+        while (later := self.read(partition)) != names:
+            names = later
+        return names
+
+    def write(self, partition, names):
+        call("flash_erase", "--quiet", f"/dev/mtd{partition}", "0", "0")
+        start = 0
+        while start < len(names):
+            end = start
+            while end < len(names) and names[end] is not None:
+                end += 1
+            if end > start:
+                subprocess.run(["nandwrite", "--quiet", "--noecc", "--oob", "--start",
+                                str(start * BLOCK), f"/dev/mtd{partition}", "-"], check=True,
+                               input=b"".join(self.blocks[name] for name in names[start:end]),
+                               capture_output=True)
+            start = end + 1
+
+
+class Recorder:
+    """Runs the programs of a device and stops them again and again."""
+
+    def __init__(self, chip, seed):
+        self.chip, self.random = chip, random.Random(seed)
+        self.states = []  # the step, the logs that were received, and the chip's content
+        self.step, self.received = 0, set()
+
+    def stopped(self):
+        if self.step and self.random.random() < SHARE:
+            names = self.chip.read_at_rest(0)
+            if not self.states or self.states[-1][2] != names:
+                self.states.append((self.step, frozenset(self.received), names))
+
+    def run(self, command, environment, text):
+        with open(WORK / "input", "w+", encoding="utf-8") as given, \
+                open(WORK / "errors", "w+", encoding="utf-8") as errors:
+            given.write(text)
+            given.seek(0)
+            process = subprocess.Popen(command, env={**environment, "CRASH_STOPS": "1"},
+                                       stdin=given, stdout=subprocess.DEVNULL, stderr=errors)
+            while True:
+                _, status = os.waitpid(process.pid, os.WUNTRACED)
+                if not os.WIFSTOPPED(status):
+                    process.returncode = os.waitstatus_to_exitcode(status)
+                    errors.seek(0)
+                    return process.returncode, errors.read()
+                self.stopped()
+                os.kill(process.pid, signal.SIGCONT)
+                if self.random.random() < SUDDEN:
+                    time.sleep(self.random.random() * LONGEST_RUN)
+                    os.kill(process.pid, signal.SIGSTOP)
+
+
+def attach(partition):
+    call("ubiattach", "-m", str(partition), "-d", str(partition))
+
+
+def record(device, recorder, day):
+    call("ubiformat", "--quiet", "--yes", "/dev/mtd0")
+    attach(0)
+    call("ubimkvol", "/dev/ubi0", "--name", VOLUME, "--maxavsize")
+    mount(f"ubi0:{VOLUME}", device.root, KIND)
+    server = Server(recorder.received.add)
+    server.start()
+    prepare(device, day, server.url)
+    call("sync")
+    shutil.copytree(device.root, WORK / "after/0", symlinks=True)
+    device.process = recorder.run
+    for number, step in enumerate(steps(day), 1):
+        recorder.step, device.clock = number, step.clock
+        step.action(device)
+        shutil.copytree(device.root, WORK / f"after/{number}", symlinks=True)
+        print(f"recorded: {step.name}, {len(recorder.states)} states", flush=True)
+    device.process = device.run_to_end
+    unmount(device.root)
+    call("ubidetach", "-d", "0")
+
+
+def fault_of(state, chip, device, undisturbed, seen):
+    """What is broken, and whether the content was new."""
+    number, received, names = state
+    chip.write(1, names)
+    call("dmesg", "--clear")
+    attach(1)
+    try:
+        mount(f"ubi1:{VOLUME}", device.root, KIND)
+        try:
+            digest = number, received, tree_digest(device.root)
+            if digest not in seen:
+                seen[digest] = undisturbed.fault(device, number, received)
+        finally:
+            unmount(device.root)
+    except OSError as error:
+        return f"the file system: {error}"
+    finally:
+        call("ubidetach", "-d", "1")
+    errors = [line for line in call("dmesg").splitlines() if "UBIFS error" in line]
+    return seen[digest] or (errors[0] if errors else None)
+
+
+def main():
+    programs, (day, most, seconds, seed) = sys.argv[1], map(int, sys.argv[2:])
+    deadline = time.monotonic() + seconds
+    preload = WORK / "preload.so"
+    for folder in ("device", "undisturbed"):
+        (WORK / folder).mkdir(parents=True)
+    call("cc", "-O1", "-shared", "-fPIC", "-o", str(preload),
+         str(pathlib.Path(__file__).parent / "preload.c"))
+    call("modprobe", "nandsim", f"parts={BLOCKS},{BLOCKS}", *CHIP)
+    chip = Chip()
+    recorder = Recorder(chip, seed)
+    device = Device(WORK / "device", programs, preload)
+    record(device, recorder, day)
+    undisturbed = Undisturbed(WORK / "after", WORK, steps(day),
+                              Device(WORK / "undisturbed", programs, preload))
+    chosen = list(enumerate(recorder.states))
+    random.Random(seed).shuffle(chosen)
+    judged, broken, seen = 0, 0, {}
+    for place, state in chosen[:most]:
+        if time.monotonic() > deadline:
+            break
+        fault = fault_of(state, chip, device, undisturbed, seen)
+        judged += 1
+        if fault:
+            broken += 1
+            print(f"ubifs: state {place}, in '{undisturbed.steps[state[0] - 1].name}': {fault}: "
+                  f"try again with script/crash-test --file-system ubifs --seed {seed}", flush=True)
+        if judged % 20 == 0:
+            print(f"ubifs: {judged} of {len(chosen)} states, {broken} broken", flush=True)
+    print(f"ubifs: {judged} states of {len(chosen)} that were taken, of {len(seen)} different "
+          f"contents, {broken} broken", flush=True)
+    sys.exit(broken > 0)
+
+
+if __name__ == "__main__":
+    main()

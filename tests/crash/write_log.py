@@ -1,0 +1,100 @@
+"""Reads what dm-log-writes recorded of a block device, and makes states that a power cut leaves."""
+
+import collections
+import mmap
+import struct
+
+SECTOR = 512
+MAGIC = 0x6A736677736872
+FLUSH, FUA, DISCARD, MARK = 1, 2, 4, 8
+# A flush makes durable what stands before it; FUA makes durable what is written with it.
+Entry = collections.namedtuple("Entry", "flags start length data")
+
+
+class WriteLog:
+    """The entries in their order. A mark is text; `data` of a write is its place in the log."""
+
+    def __init__(self, path):
+        with open(path, "rb") as file:
+            self.bytes = mmap.mmap(file.fileno(), 0, prot=mmap.PROT_READ)
+        magic, _, count, unit = struct.unpack_from("<QQQI", self.bytes, 0)
+        if magic != MAGIC:
+            raise ValueError(f"{path} is no log of writes")
+        self.entries = []
+        place = unit
+        for _ in range(count):
+            sector, sectors, flags, length = struct.unpack_from("<QQQQ", self.bytes, place)
+            data = place + unit
+            if flags & MARK:
+                text = self.bytes[place + 32:place + 32 + length].decode()
+                self.entries.append(Entry(flags, 0, 0, text.rstrip("\0")))
+                place = data
+            else:
+                self.entries.append(Entry(flags, sector * SECTOR, sectors * SECTOR, data))
+                place = data if flags & DISCARD else data + sectors * SECTOR
+
+    def content(self, entry):
+        """What the entry leaves on the device; what was discarded reads as zeros."""
+        if entry.flags & DISCARD:
+            return bytes(entry.length)
+        return self.bytes[entry.data:entry.data + entry.length]
+
+
+class Image:
+    """A device whose writes can be taken back."""
+
+    def __init__(self, log, size, chunk=65536):
+        self.log, self.chunk = log, chunk
+        self.bytes = bytearray(size)
+        self.used = set()  # chunks that may hold something
+        self.position = 0
+        self.undo = None
+
+    def put(self, start, content):
+        if self.undo is not None:
+            self.undo.append((start, bytes(self.bytes[start:start + len(content)])))
+        self.bytes[start:start + len(content)] = content
+        self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
+
+    def advance(self, position):
+        """All of the entries before the position, in full."""
+        while self.position < position:
+            entry = self.log.entries[self.position]
+            if entry.length:
+                self.put(entry.start, self.log.content(entry))
+            self.position += 1
+
+    def torn(self, cut, random, atom):
+        """Of the entries up to the cut any may be missing or torn, but none that were written with
+        FUA. Undone by `mend`."""
+        self.undo = []
+        share = random.choice([0.1, 0.5, 0.9])
+        for entry in self.log.entries[self.position:cut]:
+            if not entry.length:
+                continue
+            content = self.log.content(entry)
+            if entry.flags & FUA:
+                self.put(entry.start, content)
+            elif random.random() < share:
+                pieces = range(0, entry.length, atom)
+                kept = pieces if random.random() < 0.7 else random.sample(
+                    pieces, random.randint(1, len(pieces)))
+                if len(kept) == len(pieces):
+                    self.put(entry.start, content)
+                    continue
+                for piece in kept:
+                    self.put(entry.start + piece, content[piece:piece + atom])
+
+    def mend(self):
+        for start, content in reversed(self.undo):
+            self.bytes[start:start + len(content)] = content
+        self.undo = None
+
+    def write(self, file):
+        file.truncate(0)
+        file.truncate(len(self.bytes))
+        whole = memoryview(self.bytes)
+        for number in sorted(self.used):
+            file.seek(number * self.chunk)
+            file.write(whole[number * self.chunk:(number + 1) * self.chunk])
+        file.flush()
