@@ -1,5 +1,6 @@
 """What a device holds, read without tavrel's own programs."""
 
+import functools
 import hashlib
 import json
 import os
@@ -74,17 +75,36 @@ def joined(database, runs):
 
 def statistics(root, scratch):
     """All rows of the store, which must be sound. It is read from a copy."""
+    present = names(root / STORE)
+    name = "BHDataStore.sqlitedb"
+    parts = [(root / STORE / file).read_bytes() if file in present else b""
+             for file in (name, name + "-wal")]
+    return rows_of(Parts(parts), scratch)
+
+
+class Parts(list):
+    """The files of a store. Many states have the same ones, which are read once."""
+
+    def __init__(self, parts):
+        super().__init__(parts)
+        self.name = hashlib.sha256(b"".join([*parts, str(len(parts[0])).encode()])).digest()
+
+    def __hash__(self):
+        return hash(self.name)
+
+    def __eq__(self, other):
+        return self.name == other.name
+
+
+@functools.lru_cache(maxsize=64)
+def rows_of(parts, scratch):
+    if not any(parts):
+        return {}
     shutil.rmtree(scratch, ignore_errors=True)
     scratch.mkdir()
-    name = "BHDataStore.sqlitedb"
-    present = names(root / STORE)
-    for file in (name, name + "-wal"):
-        if file in present:
-            shutil.copyfile(root / STORE / file, scratch / file)
-    if name not in present or not (scratch / name).stat().st_size + sum(
-            path.stat().st_size for path in scratch.glob("*-wal")):
-        return {}
-    database = sqlite3.connect(scratch / name)
+    (scratch / "store").write_bytes(parts[0])
+    (scratch / "store-wal").write_bytes(parts[1])
+    database = sqlite3.connect(scratch / "store")
     try:
         verdict = database.execute("PRAGMA integrity_check").fetchall()
         if verdict != [("ok",)]:
@@ -106,9 +126,14 @@ def statistics(root, scratch):
         database.close()
 
 
+@functools.lru_cache(maxsize=256)
+def parsed(content):
+    return plistlib.loads(content)
+
+
 def property_list(path):
     try:
-        return plistlib.loads(path.read_bytes())
+        return dict(parsed(path.read_bytes()))
     except Exception as error:  # whatever the parser says of it
         raise Broken(f"{path.name} is no property list: {error}") from None
 

@@ -14,13 +14,13 @@ import threading
 
 SOURCES = pathlib.Path(__file__).resolve().parent.parent.parent
 SECONDS = 86400
-LONGEST = 120  # seconds for one command
+LONGEST = 900  # seconds for one command
 DOMAIN = "com.norvane.tallied.tavrel.plist"
 LAST_DAY = (DOMAIN, "LastCrashLogSerializationDateInDaysSince1970")
 
-# `clock` is the time of the step, `next_clock` that of the next run after a power cut in it. `whole`:
-# its changes of statistics and preferences are there together or not at all. `again` are commands
-# that are repeated after a cut.
+# `clock` is the time of the step, `next_clock` that of the next run after a power cut in it.
+# `whole`: its changes of statistics and preferences are there together or not at all. `again` are
+# commands that are repeated after a cut.
 Step = collections.namedtuple("Step", "name clock next_clock whole action again")
 
 
@@ -130,7 +130,8 @@ def prepare(device, day, url):
                      (SOURCES / "docs/examples/registry" / recording).read_bytes())
     every = {"com.example.": {"intervals": [5, 100, 2000]}}
     device.write("Library/Application Support/Brimhold/Whitelist_Pellio.plist",
-                 {"Example": {"ScalarKeyPrefixes": {"com.example.": {}, "com.norvane.ioreport.": {}},
+                 {"Example": {"ScalarKeyPrefixes": {"com.example.": {},
+                                                    "com.norvane.ioreport.": {}},
                               "DistributionKeyPrefixes": every}})
     device.write("etc/tavrel/system-version.plist", version("16R349"))
     device.write("etc/tavrel/upload.plist", {"URL": url, "AllowPlainHTTP": True})
@@ -198,9 +199,9 @@ def steps(day):
     tidy = ("tavrelctl", "tidy")
     erase = ("tavrelctl", "erase", "--key", "com.example.import", "--yes")
     deny = ("tavrelctl", "deny")
-    first = [("import", import_day), ("fold", recorded_and_folded(6)), ("preference", preference(1)),
-             ("large import", import_much), ("second fold", recorded_and_folded(3)),
-             ("tasking", tasking)]
+    first = [("import", import_day), ("fold", recorded_and_folded(6)),
+             ("preference", preference(1)), ("large import", import_much),
+             ("second fold", recorded_and_folded(3)), ("tasking", tasking)]
     return [
         *(Step(name, noon, noon, True, action, ()) for name, action in first),
         Step("run", noon, noon, False, runs("tavrel", "-d"), ()),

@@ -28,7 +28,7 @@ libc = ctypes.CDLL(None, use_errno=True)
 def call(*command):
     done = subprocess.run(command, capture_output=True, text=True, check=False)
     if done.returncode:
-        raise RuntimeError(f"{' '.join(map(str, command))} ends with {done.returncode}: {done.stderr}")
+        raise RuntimeError(f"{command} ends with {done.returncode}: {done.stderr}")
     return done.stdout
 
 
