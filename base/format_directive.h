@@ -6,6 +6,7 @@
 
 #include <cstddef>
 #include <cstdint>
+#include <limits>
 #include <optional>
 #include <span>
 #include <string_view>
@@ -29,7 +30,8 @@ struct Directive {
   bool precisionFromArgument = false;
   std::int32_t width = 0;
   std::optional<std::int32_t> precision = std::nullopt;
-  unsigned char lengthBits = 32;  // of an integer: 8 (hh), 16 (h), 32, 64 (l, ll, j, z, t, q)
+  unsigned char lengthBits =
+      32;  // of an integer: 8 (hh), 16 (h), 32, 64 (l, ll, j, q), size_t (z, t)
   char conversion = 0;
 };
 
@@ -103,8 +105,10 @@ constexpr void takeLength(std::string_view& text, Directive& directive) {
     directive.lengthBits = 8;
   } else if (take(text, "h")) {
     directive.lengthBits = 16;
-  } else if (take(text, "ll") || takeOneOf(text, "ljztq")) {
+  } else if (take(text, "ll") || takeOneOf(text, "ljq")) {
     directive.lengthBits = 64;
+  } else if (takeOneOf(text, "zt")) {
+    directive.lengthBits = std::numeric_limits<std::size_t>::digits;
   }
 }
 

@@ -13,7 +13,9 @@ std::uint64_t keyedHash(std::string_view text);
 
 /// The same for hash tables.
 struct KeyedHash {
-  std::size_t operator()(std::string_view text) const { return keyedHash(text); }
+  std::size_t operator()(std::string_view text) const {
+    return static_cast<std::size_t>(keyedHash(text));
+  }
 };
 
 }  // namespace tavrel

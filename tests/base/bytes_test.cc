@@ -40,8 +40,9 @@ TEST(Arithmetic, IsDefinedAtTheEnds) {
   EXPECT_EQ(wrappingAdd(INT64_MAX, 1), INT64_MIN);
   EXPECT_EQ(previousDay(INT32_MIN), INT32_MAX);
   EXPECT_EQ(shiftLeft(1, 64), 0U);
-  EXPECT_EQ(checkedMultiply(1UL << 32, (1UL << 32) - 1), kMax64 - (1UL << 32) + 1);
-  EXPECT_FALSE(checkedMultiply(1UL << 32, 1UL << 32));
+  constexpr std::uint64_t kTwoTo32 = std::uint64_t{1} << 32;
+  EXPECT_EQ(checkedMultiply(kTwoTo32, kTwoTo32 - 1), kMax64 - kTwoTo32 + 1);
+  EXPECT_FALSE(checkedMultiply(kTwoTo32, kTwoTo32));
   EXPECT_EQ(saturatingInt64(9223372036854774784.0), 9223372036854774784);
   EXPECT_EQ(saturatingInt64(-9223372036854775808.0), INT64_MIN);
 }

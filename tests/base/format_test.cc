@@ -48,8 +48,12 @@ void compare(const std::vector<std::string>& conversions, const std::vector<Argu
 TEST(Format, PrintsAsTheCLibraryDoes) {
   compare<int>({"d", "i", "o", "u", "x", "X", "hhd", "hhu", "hhx", "hd", "hu", "hX", "ho"},
                {0, 1, -1, 8, 127, 128, -129, 40000, 65536, INT_MAX, INT_MIN});
-  compare<long>({"ld", "lli", "jo", "zu", "tx", "lX", "qd"},
-                {0, 1, -1, 255, 1L << 32, LONG_MAX, LONG_MIN});
+  compare<std::int64_t>({"lld", "lli", "jo", "jx", "llX", "qd"},
+                        {0, 1, -1, 255, std::int64_t{1} << 32, INT64_MAX, INT64_MIN});
+  // "l" means 64 bits everywhere.
+  if constexpr (sizeof(long) == 8)
+    compare<std::int64_t>({"ld", "lX"}, {0, 1, -1, 255, std::int64_t{1} << 32, INT64_MIN});
+  compare<std::ptrdiff_t>({"zu", "td", "tx"}, {0, 1, -1, 255, PTRDIFF_MAX, PTRDIFF_MIN});
   compare<double>({"e", "E", "f", "F", "g", "G", "a", "A", "lf"},
                   {0.0, -0.0, 1.0, -1.5, 2.5, 0.1, 1.0 / 3, 99999.95, 999999.5, -1e-5, 1e15, 1e22,
                    DBL_MAX, DBL_MIN, 4.9e-324, HUGE_VAL, -HUGE_VAL, std::nan("")});
@@ -110,7 +114,10 @@ TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
       {"%.99999999999999999999d", {1}, R"("%.9999" at byte 0)", tooWide},
       {"%*d", {INT_MIN, 1}, R"("%*d" at byte 0)", size + "2147483648, more than 4096"},
       {"%.*s", {4097, "x"}, R"("%.*s" at byte 0)", size + "4097, more than 4096"},
-      {"%*d", {1L, 1}, R"("%*d" at byte 0)", integer + "but its argument is a 64-bit integer"},
+      {"%*d",
+       {std::int64_t{1}, 1},
+       R"("%*d" at byte 0)",
+       integer + "but its argument is a 64-bit integer"},
       {"%u %s", {1, 2}, R"("%s" at byte 3)", "it takes a text, " + number},
       {"%f", {1}, R"("%f" at byte 0)", "it takes a double, " + number},
       {"%ls", {"x"}, R"("%ls" at byte 0)", "'s' takes no length"},

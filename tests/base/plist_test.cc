@@ -24,13 +24,13 @@ std::vector<std::string> keysOf(const Dictionary& dictionary) {
 TEST(Number, ComparesByValueWhateverTheKind) {
   using Case = std::tuple<Number, Number, bool>;
   for (const auto& [a, b, equal] :
-       {Case(std::int8_t{-1}, -1L, true), Case(1, 1.0F, true), Case(0, -0.0, true),
+       {Case(std::int8_t{-1}, std::int64_t{-1}, true), Case(1, 1.0F, true), Case(0, -0.0, true),
         Case(NAN, std::numeric_limits<float>::quiet_NaN(), true),
-        Case((1L << 53) + 1, kTwoTo53, false), Case(1L << 53, kTwoTo53, true),
-        Case(1UL << 63, kTwoTo63, true), Case(~0UL, 2 * kTwoTo63, false),
-        Case(INT64_MIN, -kTwoTo63, true), Case(INT64_MIN, 1UL << 63, false),
-        Case(INT64_MAX, kTwoTo63, false), Case(~0UL, -1.0, false),
-        Case(INT64_MAX, INFINITY, false)}) {
+        Case((std::int64_t{1} << 53) + 1, kTwoTo53, false),
+        Case(std::int64_t{1} << 53, kTwoTo53, true), Case(std::uint64_t{1} << 63, kTwoTo63, true),
+        Case(UINT64_MAX, 2 * kTwoTo63, false), Case(INT64_MIN, -kTwoTo63, true),
+        Case(INT64_MIN, std::uint64_t{1} << 63, false), Case(INT64_MAX, kTwoTo63, false),
+        Case(UINT64_MAX, -1.0, false), Case(INT64_MAX, INFINITY, false)}) {
     EXPECT_EQ(a == b, equal) << a.real() << " " << b.real();
     EXPECT_EQ(b == a, equal) << a.real() << " " << b.real();
   }
@@ -40,10 +40,10 @@ TEST(Number, ConvertsWithoutUndefinedResults) {
   using Case = std::pair<Number, std::int64_t>;
   for (const auto& [number, integer] :
        {Case(1e300, INT64_MAX), Case(-INFINITY, INT64_MIN), Case(-kTwoTo63, INT64_MIN),
-        Case(NAN, 0), Case(-2.9, -2), Case(~0UL, -1)})
+        Case(NAN, 0), Case(-2.9, -2), Case(UINT64_MAX, -1)})
     EXPECT_EQ(number.int64(), integer) << number.real();
-  EXPECT_EQ(Number(~0UL).real(), 2 * kTwoTo63);
-  EXPECT_EQ(Number(0x1'8000'0001L).int32(), INT32_MIN + 1);
+  EXPECT_EQ(Number(UINT64_MAX).real(), 2 * kTwoTo63);
+  EXPECT_EQ(Number(0x1'8000'0001LL).int32(), INT32_MIN + 1);
   EXPECT_EQ(Number(-1).uint32(), 0xFFFFFFFF);
 }
 
@@ -77,7 +77,8 @@ TEST(Value, EqualityLooksAtKindAndContent) {
   for (std::size_t i = 0; i < std::size(values); ++i)
     for (std::size_t j = 0; j < std::size(values); ++j)
       EXPECT_EQ(values[i] == deepCopy(values[j]), i == j) << i << " " << j;
-  EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"b", 2.0}, {"a", 1L}}));
+  EXPECT_EQ(Value(Dictionary{{"a", 1}, {"b", 2}}),
+            Value(Dictionary{{"b", 2.0}, {"a", std::int64_t{1}}}));
   EXPECT_NE(Value(Dictionary{{"a", 1}, {"b", 2}}), Value(Dictionary{{"a", 1}, {"c", 2}}));
   EXPECT_EQ(Value(Date::sinceEpoch(std::nan(""))), Value(Date::sinceEpoch(std::nan(""))));
   EXPECT_NE(Value(std::string_view("a\0b", 3)), Value("a"));

@@ -20,7 +20,7 @@ TEST(Text, WritesNumbersSoThatTheyReadBack) {
        {Case(0.1, "0.1"), Case(1e22, "1e+22"), Case(1e-5, "1e-05"), Case(-0.0, "-0"),
         Case(DBL_MAX, "1.7976931348623157e+308"), Case(4.9e-324, "5e-324"), Case(-INFINITY, "-inf"),
         Case(std::copysign(NAN, -1.0), "nan"), Case(INT64_MIN, "-9223372036854775808"),
-        Case(~0UL, "18446744073709551615")})
+        Case(UINT64_MAX, "18446744073709551615")})
     EXPECT_EQ(numberText(number), text);
   std::mt19937_64 random(3);
   for (int i = 0; i < 10000; ++i) {

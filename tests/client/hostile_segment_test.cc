@@ -103,8 +103,9 @@ TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
   for (std::uint64_t i = 0; i < 8; ++i)
     fields.insert(fields.end(), {kBHCells + 8 * i, kBHChunks + 8 * i, kBHKeyTable + 8 * i});
   for (const std::uint64_t field : fields) {
-    for (const std::uint64_t word : {0UL, 1UL, 0x7fUL, 0xffffUL, 0x7fffffffUL, 0xffffffffUL,
-                                     1UL << 62, ~0UL >> 1, 1UL << 63, ~0UL}) {
+    for (const std::uint64_t word :
+         {0UL, 1UL, 0x7fUL, 0xffffUL, 0x7fffffffUL, 0xffffffffUL, std::uint64_t{1} << 62,
+          UINT64_MAX >> 1, std::uint64_t{1} << 63, UINT64_MAX}) {
       write(field, word);
       readAll();
       boot = std::nullopt;

@@ -40,7 +40,7 @@ TEST(DailyStatisticsTest, ReportsDiskUsageInMebibytes) {
 }
 
 TEST(DailyStatisticsTest, SetsTheNumbersOfTheNandInformation) {
-  const Bytes buffer = statistics({{53, {0x20001}}, {7, {~0UL}}, {56, {0}}, {52, {12}}});
+  const Bytes buffer = statistics({{53, {0x20001}}, {7, {UINT64_MAX}}, {56, {0}}, {52, {12}}});
   StoragePlatform platform({driver(answering(buffer))});
   dailyStorageStatistics(platform.platform);
   const Scalars scalars = scalarsOf(platform);
@@ -56,7 +56,7 @@ TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
     Bytes bytes;
     append64(bytes, std::uint64_t{id} | std::uint64_t{registers} << 8U);
     for (std::uint64_t i = 0; i < 8; ++i)
-      append64(bytes, i == 0 ? ~0UL : i);
+      append64(bytes, i == 0 ? UINT64_MAX : i);
     return bytes;
   };
   // The last column is the number that is logged as unexpected, -1 for none.
@@ -95,7 +95,8 @@ TEST(DailyStatisticsTest, SetsSimpleChannelsOfTheStorageCategory) {
                        Array{5, kSimple, "left out"}};
   const auto elements = [](std::int64_t channel, std::int64_t type, std::int64_t value) {
     Bytes bytes;
-    for (const std::int64_t word : {9L, channel, type, 1L, value, 0L, 0L, 0L})
+    for (const std::int64_t word : {std::int64_t{9}, channel, type, std::int64_t{1}, value,
+                                    std::int64_t{0}, std::int64_t{0}, std::int64_t{0}})
       append64(bytes, static_cast<std::uint64_t>(word));
     return Dictionary{{"DriverID", 9}, {"ChannelID", channel}, {"Elements", Data(bytes)}};
   };
