@@ -42,9 +42,10 @@ void readDatabase(const std::string& path) {
   sqlite3_int64 size = 0;
   int code = file->pMethods->xFileSize(file, &size);
   std::array<std::byte, kBlock> block;
-  for (sqlite3_int64 at = 0; code == SQLITE_OK && at < size; at += kBlock) {
+  for (sqlite3_int64 at = 0; code == SQLITE_OK && at < size;) {
     const auto length = std::min<sqlite3_int64>(size - at, kBlock);
     code = file->pMethods->xRead(file, block.data(), static_cast<int>(length), at);
+    at += length;
   }
   // Another process may have shortened it.
   if (code != SQLITE_OK && code != SQLITE_IOERR_SHORT_READ) throw unreadable("the file", EIO);
