@@ -54,7 +54,7 @@ std::string leftOutText(const CompareAnswer& answer) {
   add(answer.missing, "without logs of both versions on these days");
   add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
                          " devices, or close to a set that was shown");
-  add(answer.unfit, "without a finite mean in one version");
+  add(answer.unfit, "whose mean or deviation is not finite in one version");
   return text.empty() ? text : "Left out:\n" + text;
 }
 

@@ -23,15 +23,13 @@ bool isPlain(std::string_view word) {
 }
 
 /// The first word of the version that names it.
-std::optional<std::string> wordFor(const Question& question, std::string_view version) {
-  while (!version.empty()) {
-    const std::string word(version.substr(0, version.find(' ')));
-    version.remove_prefix(std::min(version.size(), word.size() + 1));
+std::optional<std::string> wordFor(const Question& question, const std::string& version) {
+  std::string_view rest = version;
+  while (!rest.empty()) {
+    const std::string word(rest.substr(0, rest.find(' ')));
+    rest.remove_prefix(std::min(rest.size(), word.size() + 1));
     try {
-      if (isPlain(word)) {
-        question.readVersion(word);
-        return word;
-      }
+      if (isPlain(word) && question.readVersion(word) == version) return word;
     } catch (const std::runtime_error&) {
       // Other versions have it, too.
     }

@@ -108,7 +108,7 @@ void printFigures(FleetContext& context, const ShowSide& side, std::size_t devic
   if (areLeftOut) context.out() << "  " << noMeanText() << "\n";
   if (isUntold) {
     context.out() << "  A figure is - when no log has it, or logs of fewer than " << devicesAtLeast
-                  << " devices.\n";
+                  << " devices,\n  or when it is beyond the range of a double.\n";
   }
 }
 

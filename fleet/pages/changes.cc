@@ -23,7 +23,7 @@ std::string strengthText(const Comparison& one) {
   constexpr double kSmall = 0.2;
   constexpr double kMedium = 0.5;
   constexpr double kLarge = 0.8;
-  if (!one.effect) return "a clear change: daily logs of one version do not differ at all";
+  if (!one.effect) return "a clear change: all daily logs of each version have the same value";
   const double effect = std::abs(*one.effect);
   const char* const size = effect < kSmall    ? "slight"
                            : effect < kMedium ? "small"
@@ -31,7 +31,7 @@ std::string strengthText(const Comparison& one) {
                                               : "large";
   return std::string("a ") + size +
          " change: " + page::shortNumber(std::round(effect * 100) / 100) +
-         " times as much as daily logs of one version usually differ from their mean";
+         " standard deviations of the daily logs";
 }
 
 /// "fewer than 1 of 1,000".
@@ -82,9 +82,9 @@ std::string_view unitOf(std::string_view key) {
   return entry == nullptr ? "" : entry->unit;
 }
 
-std::string withoutMeanText(std::size_t logs) {
-  return countText(logs) + (logs == 1 ? " log that has" : " logs that have") +
-         " no mean, because some of the values are not finite or lie too far apart";
+std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast) {
+  return (logs < devicesAtLeast ? "a few" : countText(logs)) +
+         " logs that have no mean, because some of the values are not finite or lie too far apart";
 }
 
 std::string changeText(const Comparison& one) {
@@ -208,7 +208,8 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     if (!one.isReal() || logsWithoutMean(one) == 0) continue;
     html.begin("p", {{"class", "note"}});
     html.name(one.key.name);
-    html.text(" is compared without " + withoutMeanText(logsWithoutMean(one)) + ".");
+    html.text(" is compared without " +
+              withoutMeanText(logsWithoutMean(one), comparison.devicesAtLeast) + ".");
     html.end();
   }
   const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;

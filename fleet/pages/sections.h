@@ -21,7 +21,7 @@ std::string_view unitOf(std::string_view key);
 /// "20 % higher (120 ms → 144 ms)".
 std::string changeText(const Comparison& one);
 /// "2 logs that have no mean, because ...".
-std::string withoutMeanText(std::size_t logs);
+std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast);
 /// "1,234".
 std::string countText(std::size_t count);
 

@@ -162,8 +162,9 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
     writeSets(html, side, name, unit);
     const std::size_t withoutMean = side.whole.merged ? side.whole.merged->logsWithoutMean : 0;
     if (withoutMean != 0) {
-      html.element("p", "The mean is without " + withoutMeanText(withoutMean) + ".",
-                   {{"class", "note"}});
+      html.element(
+          "p", "The mean is without " + withoutMeanText(withoutMean, answer.devicesAtLeast) + ".",
+          {{"class", "note"}});
     }
     html.begin("div", {{"class", "cards"}});
     if (side.groups.empty()) writeHistogramOf(html, side.whole, name);

@@ -91,7 +91,7 @@ TEST(CompletionTest, HasEveryCommandAndOption) {
     EXPECT_EQ(std::system(parses.c_str()), 0) << shell;
   }
   const std::string zsh = device.run("completion zsh").out;
-  for (const char* const spec : {"'--root=[Folder of the device]:DIR:_files -/'", "--day=["})
+  for (const char* const spec : {"'(--root)--root=[Folder that holds", "--day=["})
     EXPECT_NE(zsh.find(spec), zsh.npos) << spec;
   EXPECT_EQ(device.run("--help").out.find("completion"), std::string::npos);
 }

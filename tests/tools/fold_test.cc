@@ -87,7 +87,7 @@ TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
   }
   constexpr std::string_view kAdvice =
       ": Too many open files; raise the number of files that a process may open (ulimit -n)\n";
-  EXPECT_EQ(said[format("tavrelctl: cannot open %s%s", folder.string(), kAdvice)], 1);
+  EXPECT_GE(said[format("tavrelctl: cannot open %s%s", folder.string(), kAdvice)], 1);
 }
 
 }  // namespace

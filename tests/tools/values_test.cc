@@ -85,7 +85,7 @@ TEST(Days, AreNumbersOrDates) {
   EXPECT_EQ(*parseDay("yesterday", 20773), 20772);
 }
 
-std::string printed(const Table& table, std::optional<std::size_t> columns = std::nullopt,
+std::string printed(Table table, std::optional<std::size_t> columns = std::nullopt,
                     bool isColoured = false) {
   std::ostringstream out;
   table.print({out, columns, isColoured});

@@ -36,7 +36,7 @@ class Collector {
   Collector(ToolContext& context, ValueRecorder& recorder, std::uint64_t readingsPerCount)
       : sources_(context.root()), recorder_(recorder), readingsPerCount_(readingsPerCount) {}
 
-  void startFrom(CollectState state) { last_ = std::move(state); }
+  void startFrom(std::optional<CollectState> last) { last_ = std::move(last); }
 
   void read(std::chrono::nanoseconds at) {
     const ValueTime time = valueTimeNow();
@@ -200,32 +200,36 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
 
 namespace {
 
-// The reading that a run leaves for the next one.
-class LastReading {
+// Takes single readings, each of which goes on from the one that a file has from the reading
+// before.
+class SingleReadings {
  public:
-  LastReading(ToolContext& context, const std::string& file)
-      : path_(file.empty() ? context.root().path("/run/tavrel/collect.state") : file),
-        boot_(bootIdentity(context.root())) {}
+  SingleReadings(ToolContext& context, ValueRecorder& recorder, const std::string& stateFile)
+      : context_(context),
+        path_(stateFile.empty() ? context.root().path("/run/tavrel/collect.state") : stateFile),
+        boot_(bootIdentity(context.root())),
+        collector_(context, recorder, 1) {}
 
-  /// Lets `collector` go on from it. One that cannot be used is noted.
-  void giveTo(Collector& collector, ToolContext& context, std::chrono::nanoseconds now) const {
-    auto state = readCollectState(path_, boot_, now);
-    if (!state) {
-      context.note(format("this sample has no rates: %s", state.error().message));
-    } else if (*state) {
-      collector.startFrom(std::move(**state));
+  Status take(std::chrono::nanoseconds now) {
+    auto before = readCollectState(path_, boot_, now);
+    if (!before) {
+      context_.note(format("this sample has no rates: %s", before.error().message));
+      collector_.startFrom(std::nullopt);
+    } else {
+      collector_.startFrom(std::move(*before));
     }
+    collector_.read(now);
+    // The state comes first: when the run is killed before it has kept the values, those are lost.
+    // The other way the next reading would count them again.
+    if (Status done = writeCollectState(path_, boot_, collector_.state()); !done) return done;
+    return collector_.keep();
   }
-
-  Status replace(const Collector& collector) const {
-    return writeCollectState(path_, boot_, collector.state());
-  }
-
-  Status remove() const { return removeCollectState(path_); }
 
  private:
+  ToolContext& context_;
   const std::string path_;
   const std::string boot_;
+  Collector collector_;
 };
 
 }  // namespace
@@ -233,15 +237,8 @@ class LastReading {
 void collectOnce(ToolContext& context, const std::string& stateFile) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
-  const LastReading last(context, stateFile);
-  Collector collector(context, **recorder, 1);
-  const std::chrono::nanoseconds now = std::chrono::steady_clock::now().time_since_epoch();
-  last.giveTo(collector, context, now);
-  collector.read(now);
-  // The state comes first: when the run is killed before it has kept the values, those are lost.
-  // The other way the next run would count them again.
-  Status done = last.replace(collector);
-  if (done) done = collector.keep();
+  SingleReadings readings(context, **recorder, stateFile);
+  const Status done = readings.take(std::chrono::steady_clock::now().time_since_epoch());
   if (!done) context.fail(done.error().message);
 }
 
@@ -249,20 +246,11 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
                   CollectPace& pace) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
-  const LastReading last(context, stateFile);
-  Collector collector(context, **recorder, 1);
-  Ticks due = pace.now();
-  last.giveTo(collector, context, due.time_since_epoch());
-  // After a kill nothing may count again what this run has counted.
-  Status done = last.remove();
-  for (; done; due = std::max(due + period, pace.now())) {
-    if (pace.endsBefore(due)) break;
-    collector.read(pace.now().time_since_epoch());
-    if (collector.isFull()) done = collector.keep();
+  SingleReadings readings(context, **recorder, stateFile);
+  for (Ticks due = pace.now(); !pace.endsBefore(due); due = std::max(due + period, pace.now())) {
+    const Status done = readings.take(pace.now().time_since_epoch());
+    if (!done) return context.fail(done.error().message);
   }
-  if (done && collector.count() > 0) done = last.replace(collector);
-  if (done) done = collector.keep();
-  if (!done) context.fail(done.error().message);
 }
 
 void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile) {

@@ -32,9 +32,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds);
 /// in `stateFile`; an empty name is the device's own.
 void collectOnce(ToolContext& context, const std::string& stateFile);
 
-/// Reads the machine now and once in each `period`, until a signal ends it or values cannot be
-/// kept. Goes on from `stateFile` as `collectOnce` does, and leaves its last reading there at a
-/// signal.
+/// Does the same now and once in each `period`, until the pace ends it or values cannot be kept.
 void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile,
                   CollectPace& pace);
 

@@ -148,9 +148,4 @@ Status writeCollectState(const std::string& path, const std::string& boot,
   return files.replace(path, asBytes(text), 0644);
 }
 
-Status removeCollectState(const std::string& path) {
-  FileSystem files;
-  return files.remove(path);
-}
-
 }  // namespace tavrel

@@ -34,7 +34,4 @@ Expected<std::optional<CollectState>> readCollectState(const std::string& path,
 Status writeCollectState(const std::string& path, const std::string& boot,
                          const CollectState& state);
 
-/// Done, too, when there is no such file.
-Status removeCollectState(const std::string& path);
-
 }  // namespace tavrel

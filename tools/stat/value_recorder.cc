@@ -3,6 +3,8 @@
 #include <brimhold/client.h>
 #include <chrono>
 #include <cstdlib>
+#include <optional>
+#include <sys/stat.h>
 #include <unistd.h>
 
 #include "base/format.h"
@@ -21,7 +23,9 @@ namespace {
 class MemoryRecorder final : public ValueRecorder {
  public:
   MemoryRecorder(std::string folder, Recorders recorders)
-      : folder_(std::move(folder)), recorders_(std::move(recorders)) {}
+      : folder_(std::move(folder)),
+        recorders_(std::move(recorders)),
+        identity_(FileSystem::status(folder_)) {}
 
   Status set(ValueTime, const std::string& key, std::int64_t value) override {
     if (Status allowed = checkRights(key); !allowed) return allowed;
@@ -39,6 +43,14 @@ class MemoryRecorder final : public ValueRecorder {
     return Done{};
   }
   Status keep() override {
+    // A fold looks for files in the folder that has the name now.
+    const auto now = FileSystem::status(folder_);
+    if (!now || !identity_ || now->st_dev != identity_->st_dev ||
+        now->st_ino != identity_->st_ino) {
+      return Error{
+          format("%s was removed: what this program recorded since then is lost: start it again",
+                 folder_)};
+    }
     if (BHClientGetStatus(nullptr) != BHClientStatusFull) return Done{};
     return Error{
         format("%s is full: values are dropped until 'tavrelctl stat fold' has run", folder_)};
@@ -57,6 +69,7 @@ class MemoryRecorder final : public ValueRecorder {
 
   std::string folder_;
   Recorders recorders_;
+  std::optional<struct stat> identity_;
   uid_t user_ = geteuid();
 };
 

@@ -128,7 +128,7 @@ class Undisturbed:
             if "run" in self.steps[number - 1].name:
                 allowed.append(0)  # a run notes a change before it files the log that tells of it
             if changes.count(change) not in allowed:
-                raise Broken(f"the change from {change} is told {changes.count(change)} times")
+                raise Broken(f"the change from {change} is reported {changes.count(change)} times")
         require("records at the end", ends[0].records & ends[1].records, found.records)
         require("records of the end", found.records, ends[0].records | ends[1].records)
         if found.torn:

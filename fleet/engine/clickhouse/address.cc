@@ -67,6 +67,7 @@ int numberIn(const std::string& name, std::string_view text, int lowest, int hig
 }
 
 std::string decoded(std::string_view text) {
+  if (text.empty()) return {};  // libcurl would read on to the end of the string
   int size = 0;
   const CurlText plain(
       curl_easy_unescape(nullptr, text.data(), static_cast<int>(text.size()), &size));
@@ -83,10 +84,9 @@ void readOptions(ServerAddress& address, std::string_view query) {
     if (name == "cluster") {
       checkName("cluster", value);
       address.cluster = value;
-    } else if (name == "password-file") {
-      address.passwordFile = value;
-    } else if (name == "ca-file") {
-      address.authorityFile = value;
+    } else if (name == "password-file" || name == "ca-file") {
+      if (value.empty()) refuse("needs a file as its " + std::string(name));
+      (name == "ca-file" ? address.authorityFile : address.passwordFile) = value;
     } else if (name == "timeout") {
       address.timeout = std::chrono::seconds(numberIn("timeout", value, 1, kLongestTimeout));
     } else if (name == "retries") {
