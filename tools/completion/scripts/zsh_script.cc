@@ -83,8 +83,8 @@ void addFunction(const CompletedProgram& program, const CommandModel& command,
     addFunction(program, below, script);
   script += functionName(command) + "() {\n";
   script += "  local -a anywhere=(" +
-             argumentOf(program, {}, program.anywhereOption(), program.anywhere) +
-             " '--help[Show how it is used]')\n";
+            argumentOf(program, {}, program.anywhereOption(), program.anywhere) +
+            " '--help[Show how it is used]')\n";
   if (!command.commands.empty()) {
     addGroup(program, command, script);
   } else {
