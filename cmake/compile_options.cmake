@@ -24,6 +24,13 @@ if(TAVREL_SANITIZE)
     $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)
   target_link_options(tavrel_options INTERFACE -fsanitize=address,undefined)
 endif()
+
+# Tests are long functions that run once: to optimise them under the sanitizers takes longer than all
+# that it saves.
+add_library(tavrel_test_options INTERFACE)
+target_link_libraries(tavrel_test_options INTERFACE tavrel_options)
+target_compile_options(tavrel_test_options INTERFACE $<$<BOOL:${TAVREL_SANITIZE}>:-O0>)
+
 if(TAVREL_FUZZ)
   target_compile_options(tavrel_options INTERFACE
     -fsanitize=fuzzer-no-link,address,undefined -fno-sanitize-recover=all)

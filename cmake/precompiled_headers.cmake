@@ -1,19 +1,23 @@
-# Headers that most sources need and that take long to compile are precompiled in release builds,
-# which nobody works with from day to day. Other builds go without: there each source must include
-# what it uses.
+# Headers that most sources need and that take long to compile are precompiled in release builds and
+# under the sanitizers, which nobody works with from day to day. Other builds go without: there each
+# source must include what it uses.
 #
-# tavrel_precompiled_headers(NAME HEADERS <header>... [LINK target...])
+# tavrel_precompiled_headers(NAME HEADERS <header>... [LINK target...] [OPTIONS target])
 #
-# Makes a target that owns the headers. Libraries below the calling folder use them.
+# Makes a target that owns the headers, compiled with the options of OPTIONS (tavrel_options unless
+# named). Libraries and tests below the calling folder use them.
 function(tavrel_precompiled_headers name)
-  cmake_parse_arguments(ARG "" "" "HEADERS;LINK" ${ARGN})
-  if(NOT CMAKE_BUILD_TYPE STREQUAL Release OR TAVREL_SANITIZE)
+  cmake_parse_arguments(ARG "" "OPTIONS" "HEADERS;LINK" ${ARGN})
+  if(NOT CMAKE_BUILD_TYPE STREQUAL Release AND NOT TAVREL_SANITIZE)
     return()
   endif()
   set(source ${CMAKE_CURRENT_BINARY_DIR}/${name}.cc)
   file(CONFIGURE OUTPUT ${source} CONTENT "// Owns precompiled headers.\n")
+  if(NOT ARG_OPTIONS)
+    set(ARG_OPTIONS tavrel_options)
+  endif()
   add_library(${name} STATIC ${source})
-  target_link_libraries(${name} PRIVATE ${ARG_LINK} tavrel_options)
+  target_link_libraries(${name} PRIVATE ${ARG_LINK} ${ARG_OPTIONS})
   target_precompile_headers(${name} PRIVATE ${ARG_HEADERS})
   set(TAVREL_PRECOMPILED_FROM ${name} PARENT_SCOPE)
 endfunction()
