@@ -174,6 +174,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   EXPECT_EQ(left.back(), kToday);
   EXPECT_EQ(report.kinds[0].removed, 100 - static_cast<std::int64_t>(left.size()));
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.days"), report.kinds[0].removed);
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.early_days"), report.kinds[0].removed - 10);
   EXPECT_GT(left.size(), 20U) << "no more than necessary";
   EXPECT_LE(fs::file_size(store.path()), (1U << 20) + (1U << 17) + 8192);
   // What is left is whole.
@@ -183,6 +184,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   tidy();
   EXPECT_EQ(daysHeld(), Days{kToday});
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.days"), 99);
+  EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.early_days"), report.kinds[0].removed - 10);
 }
 
 TEST_F(LimitsTest, KeepsDaysThatWaitWhateverTheirSize) {

@@ -192,10 +192,11 @@ TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
   device.write("/var/lib/tavrel/upload/state.plist", xmlOf(R"({"FailedAttempts": 1})"));
   expect("WARNING upload: never sent; 1 attempt failed, the last with: reason unknown\n", 1);
   device.run("stat import -",
-             "scalar\tyesterday\tcom.norvane.tavrel.limits.store.days\t3\n"
+             "scalar\tyesterday\tcom.norvane.tavrel.limits.store.days\t4\n"
+             "scalar\tyesterday\tcom.norvane.tavrel.limits.store.early_days\t3\n"
              "scalar\ttoday\tcom.norvane.brimhold.dropped\t0\n"
              "scalar\t20000\tcom.norvane.brimhold.dropped\t7\n");
-  expect("WARNING limits: since yesterday: store.days 3\n", 1);
+  expect("WARNING limits: since yesterday: store.early_days 3\n", 1);
   expect("OK lost-values: none since yesterday\n", 1);
   device.run("stat import -", "scalar\ttoday\tcom.norvane.brimhold.dropped\t9\n");
   expect("WARNING lost-values: since yesterday: dropped 9\n", 1);

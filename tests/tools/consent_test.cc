@@ -12,7 +12,10 @@ const std::string kSwitch = "com.norvane.zentrix DiagnosticSubmissionEnabled";
 const std::string kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
 
 struct Consent : testing::Test {
-  Consent() { today = device.json("status")["today"]["day"]; }
+  Consent() {
+    today = device.json("status")["today"]["day"];
+    device.write(kWhitelistFile, "<plist>");
+  }
 
   std::string text(std::int32_t day) const {
     return format("%d (%s)", day, dateText(civilFromDays(day)));
@@ -68,7 +71,22 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   device.run("deny");
   device.run("stat import", format("scalar\t%d\tk\t1\n", today + 5));
   EXPECT_NE(device.run("allow --json").error.find("submission begins after it"), std::string::npos);
-  device.check("allow", prints("submission is already " + allowed(today + 6) + "\n"));
+  device.check("allow", {0, "submission is already " + allowed(today + 6) + "\n",
+                         "tavrelctl: today is " + text(today) +
+                             ": 'tavrelctl allow --from DAY' names an earlier day\n"});
+  EXPECT_NE(
+      device.run("status --check")
+          .out.find("WARNING permission: the daily log may leave the device, from day " +
+                    text(today + 6) + " on: 'tavrelctl allow --from DAY' names an earlier day\n"),
+      std::string::npos);
+  fs::remove(device.path(kWhitelistFile));
+  EXPECT_NE(
+      device.run("allow --from today")
+          .error.find(
+              "tavrelctl: no log is made yet: cannot read " + device.path(kWhitelistFile) +
+              ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
+              "it\n"),
+      std::string::npos);
   device.run("deny");
   ASSERT_TRUE(KeptValues(device.path(kStore)).add({{0, today + 7, 1, "k"}}));
   EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 8);

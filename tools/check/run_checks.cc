@@ -102,7 +102,12 @@ void checkPermission(CheckScene& scene) {
       check.text = format("%s is %s: set it as an integer", kSubmissionFirstDayKey,
                           kindWithArticle(firstDay));
     } else if (isAllowed && firstDay.number() && firstDay.number()->int64() >= scene.today) {
-      check.text += format(", from day %s on", dayText(firstDay.number()->int32()));
+      const auto day = firstDay.number()->int32();
+      check.text += format(", from day %s on", dayText(day));
+      if (day - 1 > scene.today) {
+        check.state = CheckState::Warning;
+        check.text += ": 'tavrelctl allow --from DAY' names an earlier day";
+      }
     }
   }
   scene.checks.push_back(std::move(check));

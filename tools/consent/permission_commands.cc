@@ -15,6 +15,7 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
+#include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
 
@@ -86,6 +87,21 @@ void printAllowed(ToolContext& context, const SubmissionPermission& permission, 
   context.out() << "submission is " << (isNew ? "" : "already ") << textOf(permission) << '\n';
 }
 
+void printAlreadyAllowed(ToolContext& context, const SubmissionPermission& permission,
+                         std::int32_t today) {
+  printAllowed(context, permission, false);
+  if (permission.firstDay && *permission.firstDay - 1 > today) {
+    context.note(
+        format("today is %s: 'tavrelctl allow --from DAY' names an earlier day", dayText(today)));
+  }
+}
+
+/// What else the first log needs.
+void noteMissingWhitelist(ToolContext& context) {
+  const WhitelistState whitelist = whitelistState(context);
+  if (whitelist.isMissing) context.note("no log is made yet: " + whitelist.fault);
+}
+
 void allow(ToolContext& context, const AllowArguments& arguments) {
   const auto stored = storedSubmissionPermission(context.preferences());
   if (!stored) return context.fail(stored.error().message);
@@ -98,18 +114,18 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
         format("day %s is before 1970: give a number of days since then", dayText(*first)));
   }
   if (!isNamed && stored->isGiven && !stored->firstDay)
-    return printAllowed(context, *stored, false);
+    return printAlreadyAllowed(context, *stored, today);
   if (!isNamed) first = firstDayFromNow(context, today);
   if (!first) return context.fail(first.error().message);
 
   // What waits was permitted; a later first day would withdraw that in part.
   if (stored->isGiven && (!stored->firstDay || *first > *stored->firstDay)) {
-    if (!isNamed) return printAllowed(context, *stored, false);
+    if (!isNamed) return printAlreadyAllowed(context, *stored, today);
     return context.fail(format("submission is already %s: a later day needs 'tavrelctl deny' first",
                                textOf(*stored)));
   }
   const SubmissionPermission permission{true, *first};
-  if (*stored == permission) return printAllowed(context, permission, false);
+  if (*stored == permission) return printAlreadyAllowed(context, permission, today);
   if (!stored->isGiven) {
     const RemovedLogs removed = context.linuxPlatform().submission().removeWaiting();
     if (removed.logs > 0) {
@@ -132,6 +148,7 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
                "it; give --from DAY if a wrong clock recorded it",
                dayText(*first - 1), dayText(today)));
   }
+  noteMissingWhitelist(context);
 }
 
 // The switch goes first: from then on nothing is filed or sent, and whatever ends this process, the

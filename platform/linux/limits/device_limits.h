@@ -75,7 +75,7 @@ inline constexpr std::array kKeptKinds = {
              "withheld logs",
              "log",
              "com.norvane.tavrel.limits.withheld.logs",
-             {kAnyDays, kMebibyte}},
+             {8, kMebibyte}},
     KeptKind{Kept::Refused,
              "Refused",
              "refused logs",

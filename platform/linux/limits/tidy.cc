@@ -102,6 +102,7 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
     }
     tidied.days.push_back(day);
     ++tidied.removed;
+    tidied.early += left <= bounds.days ? 1 : 0;
     --left;
     bytes = (*trim)->bytesInUse();
   }
@@ -115,19 +116,22 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
 void Tidy::count(const TidyReport& report, std::vector<std::string>& failures) {
   const std::int32_t today = store_.BHDaysSince1970();
   bool hasCounted = false;
-  for (const TidiedKind& tidied : report.kinds) {
-    if (tidied.removed == 0) continue;
-    std::int64_t sum = tidied.removed;
+  const auto add = [&](std::string_view statistic, std::int64_t removed) {
+    if (removed == 0) return;
+    std::int64_t sum = removed;
     if (const auto history = store_.openHistory(); history && (*history)->hasStore()) {
-      const Status read =
-          (*history)->walkScalar(tidied.kind->statistic, today, today,
-                                 [&](std::string_view, std::int32_t, std::int64_t value, bool&) {
-                                   sum = wrappingAdd(sum, value);
-                                 });
+      const Status read = (*history)->walkScalar(
+          statistic, today, today, [&](std::string_view, std::int32_t, std::int64_t value, bool&) {
+            sum = wrappingAdd(sum, value);
+          });
       if (!read) failures.push_back(read.error().message);
     }
-    store_.BHClientSetValueForScalarKey(tidied.kind->statistic, sum);
+    store_.BHClientSetValueForScalarKey(statistic, sum);
     hasCounted = true;
+  };
+  for (const TidiedKind& tidied : report.kinds) {
+    add(tidied.kind->statistic, tidied.removed);
+    add(kEarlyDaysStatistic, tidied.early);
   }
   if (hasCounted && !store_.commit()) failures.emplace_back("what was removed is not counted");
 }

@@ -23,10 +23,16 @@ namespace tavrel {
 /// A line for each thing that the last tidy could not do; missing when there was nothing.
 inline constexpr std::string_view kTidyFailuresFile = "/var/lib/tavrel/tidy-failures";
 
+/// Counts `TidiedKind::early`. A store that is as old as its limit gives up a day each day; one
+/// that is too large gives them up early.
+inline constexpr std::string_view kEarlyDaysStatistic =
+    "com.norvane.tavrel.limits.store.early_days";
+
 struct TidiedKind {
   const KeptKind* kind = nullptr;
   Bounds bounds;
   std::int64_t removed = 0;        // items
+  std::int64_t early = 0;          // of these, days of the store that its limit of days would keep
   std::vector<std::int32_t> days;  // of the store, those that went
   bool exceeds = false;            // what must stay takes more than the store's bounds
 };
