@@ -41,8 +41,9 @@ class Server:
         os.makedirs(self.path("srv"))
         for name, extra in (("ca", ()), ("server", ("-addext", "subjectAltName=IP:127.0.0.1")),
                             ("device", ())):
-            signed = () if name == "ca" else ("-CA", self.path("ca.crt"), "-CAkey",
-                                              self.path("ca.key"))
+            signed = () if name == "ca" else (
+                "-CA", self.path("ca.crt"), "-CAkey", self.path("ca.key"), "-addext",
+                "basicConstraints=critical,CA:FALSE")
             call("openssl", "req", "-x509", "-days", "2", "-nodes", "-newkey", "ec", "-pkeyopt",
                  "ec_paramgen_curve:P-256", "-subj", f"/CN={name}", "-out",
                  self.path(f"{name}.crt"), "-keyout", self.path(f"{name}.key"), *extra, *signed)

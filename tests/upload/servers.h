@@ -68,17 +68,20 @@ class Nginx {
   int port = 0;
 
  private:
-  // Certificates of two authorities, the server for 127.0.0.1, and a device; then nginx.
+  // Certificates of two authorities, the server for 127.0.0.1, a device, and one that the device's
+  // key signed; then nginx.
   static constexpr const char* kStart = R"(cd "$0" && mkdir srv
     make() {
       N=$1; shift
       openssl req -x509 -days 2 -nodes -newkey ec -pkeyopt ec_paramgen_curve:P-256 \
         -out "$N.crt" -keyout "$N.key" "$@" 2>>openssl.log
     }
-    signed="-CA ca.crt -CAkey ca.key"
+    signed="-CA ca.crt -CAkey ca.key -addext basicConstraints=critical,CA:FALSE"
     make ca -subj /CN=ca && cp ca.crt devices-authority.crt && make other -subj /CN=ca &&
       make server -subj /CN=s $signed -addext subjectAltName=IP:127.0.0.1 &&
       make device -subj /CN=device-7/O=Example,CN=other $signed &&
+      make forged -subj /CN=device-8 -CA device.crt -CAkey device.key &&
+      cat device.crt >>forged.crt &&
       exec nginx -p "$0" -c nginx.conf -e error.log)";
   void end() {
     if (process == 0) return;

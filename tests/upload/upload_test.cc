@@ -29,6 +29,7 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
       {server, "ca", "",
        nameOf(3) + ": the server answers 400: check the certificate and the token; next attempt"},
       {server, "ca", "other", "the server answers 400"},
+      {server, "ca", "forged", "the server answers 400"},
       {server, "other", "device", "SSL certificate problem"},
       {format("https://localhost:%d/logs", nginx.port), "ca", "device",
        "no alternative certificate subject name matches"},
@@ -42,7 +43,7 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
   device.configuration.key = nginx.folder + "other.key";
   EXPECT_EQ(device.run(true), Outcome::Misconfigured);
   EXPECT_TRUE(device.log.lines.back().ends_with(": correct the credentials of tavrel-upload"));
-  EXPECT_EQ(device.state().failedAttempts, 6);
+  EXPECT_EQ(device.state().failedAttempts, 7);
   EXPECT_EQ(device.names().size(), 10U);
 
   device.use(server, nginx.folder, "ca", "device");

@@ -12,7 +12,8 @@ certificate() { # NAME SUBJECT [ARGUMENT...]
     -keyout "$server/$name.key" -out "$server/$name.crt" "$@" 2>/dev/null
 }
 certificate authority /CN=authority
-by="-CA $server/authority.crt -CAkey $server/authority.key"
+by="-CA $server/authority.crt -CAkey $server/authority.key
+  -addext basicConstraints=critical,CA:FALSE"
 # shellcheck disable=SC2086
 certificate server /CN=localhost $by -addext subjectAltName=DNS:localhost
 # shellcheck disable=SC2086
