@@ -1,7 +1,7 @@
 # A server that is away, a clock that goes back, and a server that is back.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 nginx -s quit 2>/dev/null
-clock '2037-11-24 01:07'
+clock '2037-11-24 00:07'
 systemctl restart tavrel-upload.service
 settle
 expect "an upload without the server" "success 75" "$(outcome tavrel-upload.service)"

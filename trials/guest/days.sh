@@ -61,10 +61,11 @@ for hour in $hours; do
   # As the kernel and the journal do some time after a change.
   journalctl --quiet --sync && sync
 done
+arrived=$(received)
 clock '2037-11-23 00:01'
 day_writes=$(($(written) - writes)) day_own=$(($(written_by_units) - own_writes))
 day_used=$(($(processor) - used))
-expect "the day after, its log is at the server" log-tallied "$(received)"
+expect "on the day after, its log is at the server" log-tallied "$arrived"
 expect "what the server has of it" "starts 20
 seconds [2.0, 6.0, 4.0, 8.0, 2]
 seconds {'(-inf, 5]': 1, '(5, inf)': 1}" "$(zcat /srv/tavrel/device-7/*.log.gz | python3 -c '
@@ -75,10 +76,12 @@ print("seconds", log["BHDistributions"]["com.example.seconds"])
 print("seconds", log["BHDistributionsHistogram"]["com.example.seconds"])')"
 expect "nothing waits" "" "$(logs pending)$(logs outbox)"
 record 3
+clock '2037-11-23 00:07'
+expect "the next day's log is filed" log-tallied "$(logs pending)"
 clock '2037-11-23 01:07'
-clock '2037-11-24 00:01'
-expect "the next day's log, too" "log-tallied
+expect "and sent on the same day" "log-tallied
 log-tallied" "$(received)"
+clock '2037-11-24 00:01'
 taken=$(($(echo "$hours" | wc -w) * $(echo "$samples" | wc -w)))
 expect "samples of the measured day" "$taken" \
   "$(tavrelctl stat show com.norvane.usage.samples --json | python3 -c '
