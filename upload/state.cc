@@ -19,6 +19,7 @@ constexpr std::pair<const char*, std::optional<plist::Date> State::*> kDates[] =
     {"NextAttempt", &State::nextAttempt}};
 constexpr std::pair<const char*, std::int64_t State::*> kCounts[] = {
     {"FailedAttempts", &State::failedAttempts},
+    {"FailedTransfers", &State::failedTransfers},
     {"Sent", &State::sent},
     {"Refused", &State::refused}};
 constexpr const char* kFailureKey = "Failure";
@@ -57,9 +58,9 @@ Status writeState(FileSystem& files, PropertyListCoding& propertyLists, const st
   return files.replace(path, asBytes(*bytes), kMode);
 }
 
-double pauseSeconds(std::int64_t failedAttempts, std::int64_t serverWish, double chance) {
+double pauseSeconds(std::int64_t failedTransfers, std::int64_t serverWish, double chance) {
   constexpr double kLongest = limits::kLongestUploadPauseSeconds;
-  const int doublings = static_cast<int>(std::clamp<std::int64_t>(failedAttempts - 1, 0, 30));
+  const int doublings = static_cast<int>(std::clamp<std::int64_t>(failedTransfers - 1, 0, 30));
   const double own = std::min(std::ldexp(limits::kUploadPauseSeconds, doublings), kLongest);
   const auto wish = static_cast<double>(serverWish);
   return std::max(own * (0.5 + 0.5 * chance),

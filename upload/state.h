@@ -20,7 +20,8 @@ struct State {
   std::optional<plist::Date> lastFailure;
   std::optional<plist::Date> nextAttempt;  // not before; absent when nothing failed last
   std::string failure;                     // the last one, one line; empty once all went well
-  std::int64_t failedAttempts = 0;         // in a row
+  std::int64_t failedAttempts = 0;         // in a row, for whatever reason
+  std::int64_t failedTransfers = 0;        // in a row; the pause follows them
   std::int64_t sent = 0;                   // in all
   std::int64_t refused = 0;                // in all
 };
@@ -33,10 +34,10 @@ State readState(FileSystem& files, PropertyListCoding& propertyLists, SystemLog&
 Status writeState(FileSystem& files, PropertyListCoding& propertyLists, const std::string& path,
                   const State& state);
 
-/// Seconds until the next attempt after so many failed ones in a row, the last of which may have
-/// brought a wish of the server (0: none). `chance`, from 0 to 1, spreads devices that failed
+/// Seconds until the next attempt after so many failed transfers in a row, the last of which may
+/// have brought a wish of the server (0: none). `chance`, from 0 to 1, spreads devices that failed
 /// together.
-double pauseSeconds(std::int64_t failedAttempts, std::int64_t serverWish, double chance);
+double pauseSeconds(std::int64_t failedTransfers, std::int64_t serverWish, double chance);
 
 /// Whether an attempt has to wait. A time that lies farther ahead than any pause was noted with
 /// another clock.

@@ -9,12 +9,14 @@
 #include <fcntl.h>
 #include <sys/file.h>
 
+#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/version.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/system_error.h"
+#include "platform/linux/logs/log_day.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/persisted_state.h"
 #include "upload/headers.h"
@@ -64,10 +66,12 @@ Uploader::Permission Uploader::permission() {
   // Read anew: whoever withdraws it is another process.
   services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
   bool isThere = false;
-  const bool isOn = services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey,
-                                                                     kDiagnosticsDomain, &isThere);
-  if (isOn) return Permission::Given;
-  return isThere ? Permission::Withdrawn : Permission::NotGiven;
+  services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain,
+                                                   &isThere);
+  permitted_ = submissionPermission(services_.preferences);
+  if (!permitted_.isGiven) return isThere ? Permission::Withdrawn : Permission::NotGiven;
+  const bool isUsable = permitted_.firstDay != SubmissionPermission::kNoDay;
+  return isUsable ? Permission::Given : Permission::NotGiven;
 }
 
 std::chrono::milliseconds Uploader::timeLeft() const {
@@ -101,9 +105,10 @@ Outcome Uploader::run(bool atOnce) {
   if (!complaint_.empty()) {
     state_.failure = complaint_;
     state_.lastFailure = services_.clock.now();
-    ++state_.failedAttempts;
-    if (outcome != Outcome::Misconfigured) outcome = Outcome::Failed;
+    // A transfer that waits is tried again, whatever else is not in order.
+    if (outcome == Outcome::Done) outcome = Outcome::Failed;
   }
+  if (failed_ || !complaint_.empty()) ++state_.failedAttempts;
   if (tried_ || !complaint_.empty()) {
     if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
         !written) {
@@ -118,6 +123,11 @@ Outcome Uploader::runLocked(bool atOnce) {
   state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
+  if (permitted_.isGiven && permitted == Permission::NotGiven) {
+    complain(
+        format("no log is sent: %s of %s is no day: set it to an integer, days since 1970-01-01",
+               kSubmissionFirstDayKey, kDiagnosticsDomain));
+  }
   if (permitted == Permission::NotGiven) return Outcome::Done;
   if (Status taken = outbox_.takePending([this] { return permission() == Permission::Given; });
       !taken) {
@@ -148,6 +158,10 @@ Outcome Uploader::runLocked(bool atOnce) {
     services_.log.log(LogLevel::Default, "logs sent: %llu, refused by the server: %llu",
                       std::uint64_t{sent_}, std::uint64_t{refused_});
   }
+  if (held_ > 0) {
+    services_.log.log(LogLevel::Info, "logs of earlier days wait: %llu; submission is %s",
+                      std::uint64_t{held_}, textOf(permitted_));
+  }
   if (tried_) state_.lastAttempt = now;
   return outcome;
 }
@@ -155,6 +169,7 @@ Outcome Uploader::runLocked(bool atOnce) {
 Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
   while (!logs.empty()) {
     const std::size_t before = sent_ + refused_;
+    held_ = 0;
     for (const WaitingLog& log : logs) {
       if (timeLeft() <= std::chrono::milliseconds(0)) {
         services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
@@ -164,8 +179,13 @@ Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
       switch (send(log)) {
         case Step::Next:
           break;
+        case Step::Held:
+          ++held_;
+          break;
         case Step::Stop:
           return Outcome::Waits;
+        case Step::Broken:
+          return Outcome::Failed;
         case Step::Withdrawn:
           return removeWaiting();
         case Step::Misconfigured:
@@ -191,22 +211,23 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
     return Step::Next;
   }
   const auto packed = packer_.pack(outbox_.logPath(log.name));
-  if (!packed) {
-    complain(packed.error().message);
+  const auto day = packed ? dayOf(log) : packed.error();
+  if (!day) {
+    complain(day.error().message);
     return Step::Next;
   }
-  if (!*packed) return Step::Next;
+  if (!*packed || !*day) return Step::Next;
   std::vector<std::string> headers = metadataHeaders(metadataOf(log));
   headers.push_back(std::string(kDigestHeader) + ": " + (*packed)->digest);
 
-  if (const Step asked = askPermission(); asked != Step::Next) return asked;
+  if (const Step asked = askPermission(**day); asked != Step::Next) return asked;
   tried_ = true;
   const auto answer =
       connection_->put(configuration_.url + "/" + log.name + ".log", headers, (*packed)->content,
                        std::min<std::chrono::milliseconds>(configuration_.transfer, timeLeft()),
-                       [this] { return permission() == Permission::Given; });
+                       [&] { return askPermission(**day) == Step::Next; });
   if (answer) return judge(log, *answer, **packed);
-  if (const Step asked = askPermission(); asked != Step::Next) return asked;
+  if (const Step asked = askPermission(**day); asked != Step::Next) return asked;
   if (connection_->isMisconfigured()) {
     complain(format("cannot send logs: %s: correct the credentials of tavrel-upload",
                     answer.error().message));
@@ -224,10 +245,20 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
   return value ? value->dictionary() : plist::Dictionary();
 }
 
-Uploader::Step Uploader::askPermission() {
+// The submission service judges a log without statistics by the day on which it was made, too.
+Expected<std::optional<std::int64_t>> Uploader::dayOf(const WaitingLog& log) {
+  const auto bytes =
+      services_.files.readIfPresent(outbox_.logPath(log.name), limits::kPropertyListBytes);
+  if (!bytes) return bytes.error();
+  if (!*bytes) return std::optional<std::int64_t>();
+  const std::optional<std::int64_t> day = dayOfLog(**bytes, services_.propertyLists);
+  return day ? day : daysFromCivil(civilFromSeconds(log.filed).date);
+}
+
+Uploader::Step Uploader::askPermission(std::int64_t day) {
   switch (permission()) {
     case Permission::Given:
-      return Step::Next;
+      return permitted_.covers(day) ? Step::Next : Step::Held;
     case Permission::Withdrawn:
       return Step::Withdrawn;
     case Permission::NotGiven:
@@ -268,41 +299,45 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
     complain(format("log %s was changed while it was sent: it is sent again", log.name));
     return Step::Next;
   }
-  if (Status removed = outbox_.remove(log.name); !removed) {
-    complain(removed.error().message);
-    return fail(log, removed.error().message);
-  }
+  if (Status removed = outbox_.remove(log.name); !removed) return failToMove(log, removed.error());
   ++sent_;
   ++state_.sent;
   state_.lastSuccess = services_.clock.now();
-  state_.nextAttempt.reset();
-  state_.failure.clear();
-  state_.failedAttempts = 0;
+  succeed();
   return Step::Next;
 }
 
 Uploader::Step Uploader::giveUp(const WaitingLog& log, long status) {
   services_.log.log(LogLevel::Error, "the server refuses log %s (%ld): it is kept in %s/refused",
                     log.name, status, outbox_.folder());
-  if (Status moved = outbox_.refuse(log.name); !moved) {
-    complain(moved.error().message);
-    return fail(log, moved.error().message);
-  }
+  if (Status moved = outbox_.refuse(log.name); !moved) return failToMove(log, moved.error());
   ++refused_;
   ++state_.refused;
+  succeed();
+  return Step::Next;
+}
+
+void Uploader::succeed() {
   state_.nextAttempt.reset();
   state_.failure.clear();
   state_.failedAttempts = 0;
-  return Step::Next;
+  state_.failedTransfers = 0;
+}
+
+Uploader::Step Uploader::failToMove(const WaitingLog& log, const Error& error) {
+  complain(error.message);
+  fail(log, error.message);
+  return Step::Broken;
 }
 
 Uploader::Step Uploader::fail(const WaitingLog& log, std::string_view why,
                               std::int64_t serverWish) {
   const plist::Date now = services_.clock.now();
-  ++state_.failedAttempts;
+  failed_ = true;
+  ++state_.failedTransfers;
   state_.lastFailure = now;
   const double next =
-      now.secondsSinceEpoch() + pauseSeconds(state_.failedAttempts, serverWish, chance());
+      now.secondsSinceEpoch() + pauseSeconds(state_.failedTransfers, serverWish, chance());
   state_.nextAttempt = plist::Date::sinceEpoch(next);
   state_.failure = format("cannot send log %s: %s", log.name, why);
   services_.log.log(LogLevel::Error, "%s; next attempt after %s", state_.failure,

@@ -15,6 +15,7 @@
 #include "platform/clock.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/submission_permission.h"
 #include "platform/preferences.h"
 #include "platform/property_list_coding.h"
 #include "platform/system_log.h"
@@ -55,19 +56,25 @@ class Uploader {
 
  private:
   enum class Permission { Given, Withdrawn, NotGiven };
-  enum class Step { Next, Stop, Withdrawn, Misconfigured };
+  enum class Step { Next, Held, Stop, Broken, Withdrawn, Misconfigured };
 
+  /// Reads `permitted_` anew. `NotGiven` also when its first day is none.
   Permission permission();
   Outcome runLocked(bool atOnce);
   Outcome sendAll(std::vector<WaitingLog> logs);
   Step send(const WaitingLog& log);
   plist::Dictionary metadataOf(const WaitingLog& log);
-  /// Whether a log may be sent now; `Next` when it may.
-  Step askPermission();
+  /// The day that the permission must cover; nothing when the log has gone.
+  Expected<std::optional<std::int64_t>> dayOf(const WaitingLog& log);
+  /// Whether a log of `day` may be sent now; `Next` when it may.
+  Step askPermission(std::int64_t day);
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
   Step confirm(const WaitingLog& log, const PackedLog& packed);
   Step giveUp(const WaitingLog& log, long status);
+  /// Notes the failure, and when the next attempt is.
   Step fail(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
+  Step failToMove(const WaitingLog& log, const Error& error);
+  void succeed();
   /// Something on the device itself is in the way.
   void complain(std::string_view line);
   Outcome removeWaiting();
@@ -81,9 +88,12 @@ class Uploader {
   const std::string statePath_;
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
   State state_;
+  SubmissionPermission permitted_;  // as of the last look
   std::size_t sent_ = 0;
   std::size_t refused_ = 0;
+  std::size_t held_ = 0;  // of the last pass, whose day is not permitted
   bool tried_ = false;
+  bool failed_ = false;    // a transfer
   std::string complaint_;  // the first of this run
 };
 

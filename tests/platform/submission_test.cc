@@ -200,6 +200,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
       {true, kToday, kNoRows, "pending", false},
       {true, kToday + 1, kNoRows, "withheld", false},
       {true, "soon", kToday - 1, "submission is allowed from day 2147483647", false},
+      {true, 1.5, kToday - 1, "submission is allowed from day 2147483647", false},
   };
   for (const auto& given : kCases) {
     SCOPED_TRACE(testing::Message() << given.isGiven << given.day << given.place);

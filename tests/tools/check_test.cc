@@ -120,6 +120,8 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
     if (*junk != 0) device.write(kWhitelistFile, junk);
     expect("WARNING last-log: the next run: no log for day", 1);
   }
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionFirstDay 1.5 --float --force");
+  expect("WARNING permission: DiagnosticSubmissionFirstDay is a real: set it as an integer\n", 1);
   device.run({"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionFirstDay", "--int",
               std::to_string(today() + 1)});
   expect("OK permission: the daily log may leave the device, from day", 1);

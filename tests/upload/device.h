@@ -25,10 +25,11 @@ inline std::string nameOf(int number) {
 struct Device : DeviceServices {
   Device() { permit("<true/>"); }
 
-  void permit(const std::string& value) const {
+  void permit(const std::string& value, const std::string& firstDay = {}) const {
+    std::string entries = "<key>DiagnosticSubmissionEnabled</key>" + value;
+    if (!firstDay.empty()) entries += "<key>DiagnosticSubmissionFirstDay</key>" + firstDay;
     write("/var/mobile/Library/Preferences/com.norvane.zentrix.plist",
-          "<plist version=\"1.0\"><dict><key>DiagnosticSubmissionEnabled</key>" + value +
-              "</dict></plist>");
+          "<plist version=\"1.0\"><dict>" + entries + "</dict></plist>");
   }
   void configure(const std::string& settings) const {
     write(upload::kConfigurationPath,

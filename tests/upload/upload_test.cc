@@ -43,7 +43,8 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
   device.configuration.key = nginx.folder + "other.key";
   EXPECT_EQ(device.run(true), Outcome::Misconfigured);
   EXPECT_TRUE(device.log.lines.back().ends_with(": correct the credentials of tavrel-upload"));
-  EXPECT_EQ(device.state().failedAttempts, 7);
+  EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().failedTransfers),
+            std::tuple(7, 6));
   EXPECT_EQ(device.names().size(), 10U);
 
   device.use(server, nginx.folder, "ca", "device");
@@ -179,18 +180,61 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
     EXPECT_EQ(requests, 1);
     EXPECT_EQ(device.names("pending").size(), isWithdrawn ? 0U : 2U);
   }
-  Device device;
-  device.add(nameOf(1));
-  ScriptedServer server([&](const std::string&) {
-    device.permit("<false/>");
-    return "HTTP/1.1 100 Continue\r\n\r\n";  // and no more
-  });
-  const auto begin = std::chrono::steady_clock::now();
-  EXPECT_EQ(device.runAgainst(server), Outcome::Done);
-  EXPECT_EQ(device.names(), Lines{});
-  EXPECT_EQ(device.log.lines,
-            Lines{"the permission to send logs is withdrawn: 1 that waited are removed"});
-  EXPECT_LT(std::chrono::steady_clock::now() - begin, device.configuration.stall);
+  const std::tuple<const char*, const char*, std::size_t, std::string> changes[] = {
+      {"<false/>", "", 0, "the permission to send logs is withdrawn: 1 that waited are removed"},
+      {"<true/>", "<integer>20785</integer>", 2,
+       "logs of earlier days wait: 1; submission is allowed from day 20785 (2026-11-28) on"}};
+  for (const auto& [value, firstDay, left, line] : changes) {
+    Device device;
+    device.add(nameOf(1));
+    ScriptedServer server([&, value = value, firstDay = firstDay](const std::string&) {
+      device.permit(value, firstDay);
+      return "HTTP/1.1 100 Continue\r\n\r\n";  // and no more
+    });
+    const auto begin = std::chrono::steady_clock::now();
+    EXPECT_EQ(device.runAgainst(server), Outcome::Done);
+    EXPECT_EQ(device.names().size(), left);
+    EXPECT_EQ(device.log.lines, Lines{line});
+    EXPECT_LT(std::chrono::steady_clock::now() - begin, device.configuration.stall);
+  }
+}
+
+TEST(Upload, JudgesEachLogByItsDay) {
+  const std::string kNand = "StorageStatus-20261127T180106Z-5f0c9a1e";
+  const std::string wait = "logs of earlier days wait: ";
+  const std::string none =
+      "no log is sent: DiagnosticSubmissionFirstDay of com.norvane.zentrix is no day: set it to an "
+      "integer, days since 1970-01-01";
+  // The first day, what is sent, and the last line.
+  const std::tuple<const char*, std::set<std::string>, std::string> cases[] = {
+      {"<integer>20783</integer>", {nameOf(1), kNand}, "logs sent: 2, refused by the server: 0"},
+      {"<integer>20784</integer>",
+       {kNand},
+       wait + "1; submission is allowed from day 20784 (2026-11-27) on"},
+      {"<integer>20785</integer>",
+       {},
+       wait + "2; submission is allowed from day 20785 (2026-11-28) on"},
+      {"<real>1.5</real>", {}, none},
+      {"<string>20783</string>", {}, none}};
+  for (const auto& [firstDay, expected, line] : cases) {
+    SCOPED_TRACE(firstDay);
+    Device device;
+    device.permit("<true/>", firstDay);
+    device.add(kNand);  // has no day of its own
+    device.add(nameOf(1));
+    device.write(kOutbox + nameOf(1) + ".log",
+                 "<plist version=\"1.0\"><dict><key>BHStartDate</key>"
+                 "<date>2026-11-26T00:00:00Z</date></dict></plist>");
+    std::set<std::string> sent;
+    ScriptedServer server([&](const std::string& request) {
+      sent.insert(request.substr(10, request.find(".log ") - 10));  // "PUT /logs/"
+      return kOk;
+    });
+    EXPECT_EQ(device.runAgainst(server), line == none ? Outcome::Failed : Outcome::Done);
+    EXPECT_EQ(sent, expected);
+    EXPECT_EQ(device.names().size(), 4 - 2 * sent.size());
+    EXPECT_EQ(device.log.lines.back(), line);
+  }
 }
 
 TEST(Upload, LosesNoLogThatChangesMeanwhile) {

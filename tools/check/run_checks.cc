@@ -86,6 +86,7 @@ void checkPermission(CheckScene& scene) {
   const plist::Value firstDay =
       preferences.ZTXPreferencesGetValue(kSubmissionFirstDayKey, kDiagnosticsDomain);
   const bool isAllowed = value.boolean().value_or(false);
+  const auto day = firstDay.number();
   if (scene.context.hasComplaints()) {
     check.state = CheckState::Unknown;
     check.text = "preferences cannot be read";
@@ -97,14 +98,13 @@ void checkPermission(CheckScene& scene) {
       check.state = CheckState::Warning;
       check.text = format("%s is %s, which counts as no: set it as a boolean",
                           kSubmissionEnabledKey, kindWithArticle(value));
-    } else if (isAllowed && !firstDay.isNull() && !firstDay.number()) {
+    } else if (isAllowed && !firstDay.isNull() && (!day || day->isFloating())) {
       check.state = CheckState::Warning;
       check.text = format("%s is %s: set it as an integer", kSubmissionFirstDayKey,
                           kindWithArticle(firstDay));
-    } else if (isAllowed && firstDay.number() && firstDay.number()->int64() >= scene.today) {
-      const auto day = firstDay.number()->int32();
-      check.text += format(", from day %s on", dayText(day));
-      if (day - 1 > scene.today) {
+    } else if (isAllowed && day && day->int64() >= scene.today) {
+      check.text += format(", from day %s on", dayText(day->int32()));
+      if (day->int64() - 1 > scene.today) {
         check.state = CheckState::Warning;
         check.text += ": 'tavrelctl allow --from DAY' names an earlier day";
       }

@@ -1,14 +1,13 @@
 #include "tools/log/log_document.h"
 
-#include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
-#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/iso_date.h"
 #include "base/text.h"
 #include "platform/linux/logs/file_submission.h"
+#include "platform/linux/logs/log_day.h"
 #include "tools/log/log_faults.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
@@ -132,14 +131,6 @@ Json jsonOfDistributions(const std::vector<DistributionView>& views) {
 }
 
 }  // namespace
-
-std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log) {
-  const auto start = log.date("BHStartDate");
-  if (!start) return std::nullopt;
-  const double day = std::floor(start->secondsSince1970() / static_cast<double>(kSecondsPerDay));
-  if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
-  return static_cast<std::int32_t>(day);
-}
 
 void printEnvelope(const Page& page, const LogEnvelope& envelope) {
   printField(

@@ -19,9 +19,6 @@ struct LogEnvelope {
   plist::Dictionary metadata;
 };
 
-/// The day that a log reports.
-std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log);
-
 /// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
 /// a tallied log has it. `document` is the log when it is a property list.
 void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictionary& document);

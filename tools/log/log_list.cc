@@ -7,11 +7,11 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
-#include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/log_day.h"
 #include "platform/plist/coding.h"
 #include "report/bh_report.h"
 #include "tools/log/filed_logs.h"
@@ -20,19 +20,6 @@
 
 namespace tavrel {
 namespace {
-
-// The day of a log in the form in which the daemon writes it. Text in it has no "<", and what lies
-// deeper has more tabs, so that nothing else looks like this; a log of many keys need not be parsed
-// for it. Nothing for a log in another form.
-std::optional<std::int32_t> dayInText(std::string_view text) {
-  constexpr std::string_view kBefore = "\n\t<key>BHStartDate</key>\n\t<date>";
-  if (!text.ends_with("</plist>\n")) return std::nullopt;
-  const std::size_t found = text.rfind(kBefore);
-  if (found == text.npos) return std::nullopt;
-  text.remove_prefix(found + kBefore.size());
-  const auto start = parseIsoInstant(text.substr(0, text.find('<')));
-  return start ? dayOfLog({{"BHStartDate", *start}}) : std::nullopt;
-}
 
 // Metadata does not hold the day that a log reports. `unread` gets the first failure to read one.
 std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
@@ -43,9 +30,8 @@ std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
   const auto bytes =
       context.linuxPlatform().fileSystem().read(log.path, limits::kPropertyListBytes);
   if (!bytes && !unread && FileSystem::status(log.path)) unread = bytes.error();
-  if (const auto day = bytes ? dayInText(*bytes) : std::nullopt) return day;
-  const auto document = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(Error{});
-  return document ? dayOfLog(document->dictionary()) : std::nullopt;
+  plist::PlistCoding propertyLists;
+  return bytes ? dayOfLog(*bytes, propertyLists) : std::nullopt;
 }
 
 // Nothing records whether a run was forced, but a gated run reports the day before its own.

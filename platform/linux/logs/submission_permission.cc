@@ -1,7 +1,5 @@
 #include "platform/linux/logs/submission_permission.h"
 
-#include <limits>
-
 #include "base/civil_time.h"
 #include "base/format.h"
 #include "platform/linux/preferences/file_preferences.h"
@@ -13,11 +11,11 @@ namespace {
 
 std::optional<std::int32_t> firstDayOf(const plist::Value& stored) {
   if (stored.isNull()) return std::nullopt;
-  constexpr auto kNever = std::numeric_limits<std::int32_t>::max();
+  constexpr auto kNoDay = SubmissionPermission::kNoDay;
   const auto number = stored.number();
-  const std::int64_t day = number ? number->int64() : kNever;
-  const bool isDay = day >= std::numeric_limits<std::int32_t>::min() && day <= kNever;
-  return isDay ? static_cast<std::int32_t>(day) : kNever;
+  const std::int64_t day = number && !number->isFloating() ? number->int64() : kNoDay;
+  const bool isDay = day >= std::numeric_limits<std::int32_t>::min() && day <= kNoDay;
+  return isDay ? static_cast<std::int32_t>(day) : kNoDay;
 }
 
 }  // namespace

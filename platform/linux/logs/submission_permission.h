@@ -8,6 +8,7 @@
 #pragma once
 
 #include <cstdint>
+#include <limits>
 #include <optional>
 #include <string>
 
@@ -20,17 +21,21 @@ class FilePreferences;
 class Preferences;
 
 struct SubmissionPermission {
+  /// A first day that is none: it holds everything back.
+  static constexpr std::int32_t kNoDay = std::numeric_limits<std::int32_t>::max();
+
   bool isGiven = false;                  // the switch
   std::optional<std::int32_t> firstDay;  // nothing: any day
 
-  /// Whether statistics of `day` may leave the device.
+  /// Whether a log of `day` may leave the device: the day of its statistics, or the one on which a
+  /// log without statistics was made.
   bool covers(std::int64_t day) const { return isGiven && (!firstDay || day >= *firstDay); }
 
   bool operator==(const SubmissionPermission&) const = default;
 };
 
 /// As this process sees it: not given when preferences cannot be read. A first day that is no
-/// integer of 32 bits counts as the last day of all.
+/// integer of 32 bits counts as `kNoDay`.
 SubmissionPermission submissionPermission(Preferences& preferences);
 
 /// As storage has it at this moment; an error when it cannot be read.

@@ -1,0 +1,44 @@
+#include "platform/linux/logs/log_day.h"
+
+#include <cmath>
+
+#include "base/bytes.h"
+#include "base/civil_time.h"
+#include "base/iso_date.h"
+
+namespace tavrel {
+namespace {
+
+std::optional<std::int32_t> dayOf(plist::Date start) {
+  const double day = std::floor(start.secondsSince1970() / static_cast<double>(kSecondsPerDay));
+  if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
+  return static_cast<std::int32_t>(day);
+}
+
+// The day of a log in the form in which the daemon writes it. Text in it has no "<", and what lies
+// deeper has more tabs, so that nothing else looks like this; a log of many keys need not be parsed
+// for it. Nothing for a log in another form.
+std::optional<std::int32_t> dayInText(std::string_view text) {
+  constexpr std::string_view kBefore = "\n\t<key>BHStartDate</key>\n\t<date>";
+  if (!text.ends_with("</plist>\n")) return std::nullopt;
+  const std::size_t found = text.rfind(kBefore);
+  if (found == text.npos) return std::nullopt;
+  text.remove_prefix(found + kBefore.size());
+  const auto start = parseIsoInstant(text.substr(0, text.find('<')));
+  return start ? dayOf(*start) : std::nullopt;
+}
+
+}  // namespace
+
+std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log) {
+  const auto start = log.date("BHStartDate");
+  return start ? dayOf(*start) : std::nullopt;
+}
+
+std::optional<std::int32_t> dayOfLog(std::string_view bytes, PropertyListCoding& propertyLists) {
+  if (const auto day = dayInText(bytes)) return day;
+  const auto document = propertyLists.decode(asBytes(bytes));
+  return document ? dayOfLog(document->dictionary()) : std::nullopt;
+}
+
+}  // namespace tavrel
