@@ -9,6 +9,7 @@
 
 #include "base/format.h"
 #include "base/limits.h"
+#include "platform/linux/files/property_list_file.h"
 
 namespace tavrel::upload {
 namespace {
@@ -158,6 +159,7 @@ Expected<Configuration> readConfiguration(const DeviceRoot& root, FileSystem& fi
   const auto bytes = files.readIfPresent(path, limits::kSystemFactBytes);
   if (!bytes) return bytes.error();
   if (!*bytes) return unusable("it is missing: make it as tavrel-upload(8) says");
+  if (const auto reason = reasonToDistrust(path); !reason.empty()) return unusable(reason);
   const auto value = propertyLists.decode(asBytes(**bytes));
   if (!value) return unusable(value.error().message);
   const plist::Dictionary settings = value->dictionary();

@@ -127,6 +127,12 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
   for (const auto& [settings, why] : cases)
     EXPECT_EQ(configured(settings).error().message, "cannot use " + at + ": " + why) << settings;
   const std::string good = url + "https://[::1]:8443/a/</string>";
+  device.configure(good);
+  fs::permissions(at, fs::perms(0646));
+  EXPECT_EQ(
+      configured(good).error().message,
+      "cannot use " + at + ": others than root may write it; make root its owner, with mode 0644");
+  fs::permissions(at, fs::perms(0644));
   EXPECT_EQ(configured(good)->host, "::1");
   EXPECT_EQ(configured(good)->url, "https://[::1]:8443/a");
   device.write("/credentials/tavrel-upload.token", "two words\n");
@@ -160,15 +166,20 @@ TEST(Upload, TellsTheServiceManagerHowItEnded) {
   };
   EXPECT_EQ(run(""), 0) << "nothing to do";
   device.add(nameOf(1), "pending/");
+  device.write(kOutbox + "log tallied-20261127T180000Z-5f0c9a1e.log", "not ours");
   for (const char* arguments : {"", "--now", ""})
-    EXPECT_EQ(run(arguments), 75);
-  EXPECT_EQ(device.state().failedAttempts, 2);
+    EXPECT_EQ(run(arguments), 75) << "what cannot be sent does not end the attempts";
+  EXPECT_TRUE(
+      device.state().failure.ends_with(": it is not named like a log of this system; "
+                                       "remove it"));
   for (const char* arguments : {"--then", "then"})
     EXPECT_EQ(run(arguments), 2);
   EXPECT_EQ(run("--version"), 0);
   EXPECT_EQ(run("", "/missing"), 1);
   device.configure("");
   EXPECT_EQ(run(""), 78);
+  EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().failedTransfers),
+            std::tuple(3, 2));
 }
 
 }  // namespace

@@ -1,5 +1,7 @@
 #include "platform/linux/files/property_list_file.h"
 
+#include <unistd.h>
+
 #include "base/limits.h"
 
 namespace tavrel {
@@ -17,6 +19,15 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
   const std::string reason = value ? "it is not a dictionary" : value.error().message;
   log.log(LogLevel::Error, "cannot read %s: %s; repair or remove it", path, reason);
   return {};
+}
+
+std::string_view reasonToDistrust(const std::string& path) {
+  const auto status = FileSystem::status(path);
+  if (status && (status->st_uid == 0 || status->st_uid == geteuid()) &&
+      (status->st_mode & (S_IWGRP | S_IWOTH)) == 0) {
+    return {};
+  }
+  return "others than root may write it; make root its owner, with mode 0644";
 }
 
 }  // namespace tavrel

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
 #include "base/plist.h"
 #include "platform/linux/files/file_system.h"
@@ -14,5 +15,9 @@ namespace tavrel {
 /// system log, when it cannot be read or is not a dictionary.
 plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& propertyLists,
                                      SystemLog& log, const std::string& path);
+
+/// Why settings that decide about others' data are not to be trusted. Empty when nobody but root
+/// and this process's user may write the file.
+std::string_view reasonToDistrust(const std::string& path);
 
 }  // namespace tavrel

@@ -54,12 +54,8 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
     }
     return recorders;
   }
-  const bool isTrusted = (status->st_uid == 0 || status->st_uid == geteuid()) &&
-                         (status->st_mode & (S_IWGRP | S_IWOTH)) == 0;
-  if (!isTrusted) {
-    log.log(LogLevel::Error,
-            "%s is ignored: others than root may write it; make root its owner, with mode 0644",
-            path);
+  if (const auto reason = reasonToDistrust(path); !reason.empty()) {
+    log.log(LogLevel::Error, "%s is ignored: %s", path, reason);
     return recorders;
   }
   const plist::Dictionary content = readDictionaryFile(files, propertyLists, log, path);

@@ -7,6 +7,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/text.h"
+#include "platform/linux/files/property_list_file.h"
 
 namespace tavrel {
 namespace {
@@ -70,11 +71,7 @@ Expected<DeviceLimits> DeviceLimits::read(const DeviceRoot& root, FileSystem& fi
     if (lstat(path.c_str(), &link) == 0) return refuse("it is a link that leads nowhere");
     return limits;
   }
-  const auto status = FileSystem::status(path);
-  if (!status || (status->st_uid != 0 && status->st_uid != geteuid()) ||
-      (status->st_mode & (S_IWGRP | S_IWOTH)) != 0) {
-    return refuse("others than root may write it; make root its owner, with mode 0644");
-  }
+  if (const auto reason = reasonToDistrust(path); !reason.empty()) return refuse(reason);
   const auto value = propertyLists.decode(asBytes(**bytes));
   if (!value) return refuse(value.error().message);
   if (!value->dictionary()) return refuse("it is not a dictionary");
