@@ -694,16 +694,26 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   EXPECT_FALSE(site.setAside(FileIdentity{1, 1}, {StoreFault::Damaged, "damaged"}));
   EXPECT_EQ(scalarsOfToday().size(), 1U);
 
-  for (const bool pipe : {true, false}) {
+  const std::string elsewhere = root.path("/elsewhere");
+  std::ofstream(elsewhere).close();
+  const auto link = [&](const char* path) { return symlink(elsewhere.c_str(), path); };
+  const auto pipe = [](const char* path) { return mkfifo(path, 0600); };
+  const auto folder = [](const char* path) { return mkdir(path, 0700); };
+  const std::pair<std::function<int(const char*)>, const char*> kObstacles[] = {
+      {link, "is a symbolic link"},
+      {pipe, "is not a regular file"},
+      {folder, "is not a regular file"}};
+  for (const auto& [make, what] : kObstacles) {
     std::filesystem::remove(store_->path());
-    ASSERT_EQ(pipe ? mkfifo(store_->path().c_str(), 0600) : mkdir(store_->path().c_str(), 0700), 0);
+    ASSERT_EQ(make(store_->path().c_str()), 0);
     log.lines.clear();
     store_ = open();
     EXPECT_EQ(scalarsOfToday(), Rows{});
     store_->BHClientSetValueForScalarKey("k", 1);
     EXPECT_TRUE(store_->commit()) << "kept";
-    EXPECT_EQ(log.lines, Lines{where() + "is not a regular file: move it away"});
+    EXPECT_EQ(log.lines, Lines{where() + what + ": move it away"});
   }
+  EXPECT_EQ(contentOf(elsewhere), "");
 }
 
 /// While it lives, one read of SQLite fails, or all from it on.
@@ -859,7 +869,8 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   ASSERT_EQ(chmod(store_->path().c_str(), 0444), 0);
   ASSERT_EQ(chmod(folder.c_str(), 0555), 0);
   asAnother("k=1;", readAll);
-  asAnother(where() + "attempt to write a readonly database" + advice + waits + denied,
+  asAnother(where() + "attempt to write a readonly database" + advice +
+                "; 1 value is not kept yet: cannot lock " + folder + "/.lock: " + denied,
             writeAndTell);
   ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
   write(std::string(kStorePath) + "-wal", "left behind");
@@ -893,7 +904,7 @@ TEST_F(StoreTest, ReadersThatChangeNothingLeaveNoTraceAndSayWhenWritersInterfere
   settle();
   const auto fileCount = [&] {
     const auto folder = std::filesystem::path(store_->path()).parent_path();
-    return std::distance(std::filesystem::directory_iterator(folder), {});
+    return std::ssize(*FileSystem().list(folder));
   };
   SqliteStore reader(root, clock, preferences, log, 10'000, true);
   int rows = 0;

@@ -19,6 +19,9 @@ namespace {
 constexpr std::string_view kTemporaryPrefix = ".tavrel-";
 constexpr std::string_view kTemporarySuffix = ".tmp";
 
+constexpr const char* kLockName = "/.lock";
+constexpr mode_t kLockMode = 0600;
+
 // Opening must not wait for the other end of a FIFO, nor make a terminal the controlling one.
 constexpr int kOpenSafely = O_NONBLOCK | O_NOCTTY;
 
@@ -41,6 +44,12 @@ Error notRegular(const std::string& path, mode_t mode) {
 Error tooLarge(const std::string& path, std::size_t largest) {
   return Error{"cannot use " + path + ": it has more than " + std::to_string(largest) +
                " bytes; move it away"};
+}
+
+// For a file that is opened without following a link.
+Error cannotOpen(std::string_view what, const std::string& path) {
+  if (errno != ELOOP) return systemError(what, path);
+  return Error{"cannot use " + path + ": it is a symbolic link; move it away"};
 }
 
 using Folder = std::unique_ptr<DIR, decltype([](DIR* folder) { closedir(folder); })>;
@@ -209,12 +218,13 @@ Status FileSystem::replace(const std::string& path, ByteSpan bytes, mode_t mode)
 }
 
 Expected<Descriptor> FileSystem::openOrMake(const std::string& path, int flags, mode_t mode) {
-  Descriptor descriptor(openFile(path.c_str(), flags | O_CREAT | kOpenSafely, mode));
+  flags |= O_CREAT | O_NOFOLLOW | kOpenSafely;
+  Descriptor descriptor(openFile(path.c_str(), flags, mode));
   if (!descriptor && errno == ENOENT) {
     if (Status made = makeFolders(folderOf(path)); !made) return made.error();
-    descriptor = Descriptor(openFile(path.c_str(), flags | O_CREAT | kOpenSafely, mode));
+    descriptor = Descriptor(openFile(path.c_str(), flags, mode));
   }
-  if (!descriptor) return systemError("write", path);
+  if (!descriptor) return cannotOpen("write", path);
   return descriptor;
 }
 
@@ -272,17 +282,49 @@ Status FileSystem::makePrivateFolder(const std::string& path) {
 }
 
 Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
-  Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, 0600);
+  Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, kLockMode);
+  if (descriptor) descriptor = keepFromOthers(*std::move(descriptor), path);
   if (!descriptor) return descriptor;
   if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
   return descriptor;
 }
 
-Expected<Descriptor> FileSystem::lockFolder(const std::string& path) {
-  Descriptor descriptor(openFile(path.c_str(), O_RDONLY | O_DIRECTORY, 0));
-  if (!descriptor) return systemError("lock", path);
-  if (Status locked = lock(descriptor.get(), path); !locked) return locked.error();
+Expected<Descriptor> FileSystem::openFolderLock(const std::string& folder) {
+  const std::string path = folder + kLockName;
+  Descriptor lock(openFile(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | kOpenSafely, kLockMode));
+  if (lock) return keepFromOthers(std::move(lock), path);
+  if (errno != ENOSPC && errno != EDQUOT) return cannotOpen("lock", path);
+  // No room for an empty file, which no other process can make either. What frees room must go on:
+  // the folder itself can be locked, even if others could hinder that.
+  Descriptor open(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
+  if (!open) return systemError("lock", folder);
+  return open;
+}
+
+Expected<Descriptor> FileSystem::lockFolder(const std::string& folder) {
+  Expected<Descriptor> descriptor = openFolderLock(folder);
+  if (!descriptor) return descriptor;
+  if (Status locked = lock(descriptor->get(), folder + kLockName); !locked) return locked.error();
   return descriptor;
+}
+
+// Whoever can open a file can lock it. Who put it into a folder is trusted with that folder, unless
+// all may write there: the uploader, which has a user of its own, and members of the folder's
+// group.
+Expected<Descriptor> FileSystem::keepFromOthers(Descriptor lock, const std::string& path) {
+  struct stat found {};
+  const auto folder = status(folderOf(path));
+  if (fstat(lock.get(), &found) != 0 || !folder) return systemError("lock", path);
+  if (!S_ISREG(found.st_mode)) return notRegular(path, found.st_mode);
+  if ((folder->st_mode & S_IWOTH) != 0 && found.st_uid != 0 && found.st_uid != geteuid() &&
+      found.st_uid != folder->st_uid) {
+    return Error{"cannot lock " + path + ": user " + std::to_string(found.st_uid) +
+                 " owns it; remove it, and do not let all users write to its folder"};
+  }
+  if ((found.st_mode & (S_IRWXG | S_IRWXO)) != 0 && fchmod(lock.get(), kLockMode) != 0) {
+    return systemError("set the mode of", path);
+  }
+  return lock;
 }
 
 Status FileSystem::lock(int descriptor, const std::string& path) {

@@ -109,9 +109,9 @@ class FileSystem {
   /// An existing file keeps its owner and its mode, except for permissions that `mode` withholds.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Opens a file to append to it; makes it and its folder when missing. Cuts off what a kill or a
-  /// power cut left after its last whole line: a line without an end, and lines of zero bytes.
-  /// Waits for another process at most `limits::kFileLockMilliseconds`.
+  /// Opens a file, no link, to append to it; makes it and its folder when missing. Cuts off what a
+  /// kill or a power cut left after the last whole line: a line without an end, lines of zero
+  /// bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
@@ -132,10 +132,13 @@ class FileSystem {
   void discardTemporaries(const std::string& folder);
 
   /// Locks the file `path`, made when missing, until the handle is released. Waits for another
-  /// process at most `limits::kFileLockMilliseconds`.
+  /// process at most `limits::kFileLockMilliseconds`. Only its owner and root can open it, and so
+  /// nobody else can lock it; of a folder that all may write, only a trusted user's is taken.
   Expected<Descriptor> lockFile(const std::string& path);
-  /// The same with a folder, which must exist.
-  Expected<Descriptor> lockFolder(const std::string& path);
+  /// The same with the file `.lock` of a folder, which must exist.
+  Expected<Descriptor> lockFolder(const std::string& folder);
+  /// Opens that file without locking it.
+  Expected<Descriptor> openFolderLock(const std::string& folder);
 
   /// Names in a folder, sorted, without those that begin with a dot; none for a missing folder.
   Expected<std::vector<std::string>> list(const std::string& folder);
@@ -157,6 +160,7 @@ class FileSystem {
   friend class AppendedFile;
   friend class NewFile;
   Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
+  Expected<Descriptor> keepFromOthers(Descriptor lock, const std::string& path);
   Status lock(int descriptor, const std::string& path);
   Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
   Status syncFolderOf(const std::string& path);

@@ -14,6 +14,9 @@ namespace {
 constexpr std::int64_t kReserveDays = 2;
 constexpr std::int64_t kLargestReservePart = 8;
 
+// The first that exists holds the lock under which one process tidies at a time.
+constexpr std::string_view kLockFolders[] = {"/run/tavrel", "/var/lib/tavrel", "/var/mobile"};
+
 std::int64_t reserveOf(std::int64_t bytesInUse, std::int64_t days, const Bounds& bounds) {
   return std::min(kReserveDays * bytesInUse / std::max<std::int64_t>(days, 1),
                   bounds.bytes / kLargestReservePart);
@@ -31,8 +34,11 @@ TidyReport Tidy::run() {
 void Tidy::trim(TidyReport& report) {
   const auto limits = DeviceLimits::read(root_, files_, propertyLists_);
   if (!limits) return report.failures.push_back(limits.error().message);
-  // The root always exists, and locking it takes no room.
-  const auto lock = files_.lockFolder(root_.path("/"));
+  Expected<Descriptor> lock = Descriptor();
+  const auto* const folder = std::ranges::find_if(
+      kLockFolders, [&](auto path) { return FileSystem::status(root_.path(path)).has_value(); });
+  // Where there is none, there is nothing to remove.
+  if (folder != std::end(kLockFolders)) lock = files_.lockFolder(root_.path(*folder));
   if (!lock) return report.failures.push_back(lock.error().message);
   const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
   for (const KeptKind& kind : kKeptKinds) {

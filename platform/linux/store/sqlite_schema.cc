@@ -73,13 +73,15 @@ bool hasTables(SqliteConnection& connection) {
 // Opening a pipe or a device in place of the store could block for ever.
 bool checkIsFile(const std::string& path) {
   struct stat status;
-  if (stat(path.c_str(), &status) != 0) {
+  if (lstat(path.c_str(), &status) != 0) {
     if (errno == ENOENT || errno == ENOTDIR) return false;
     throw StoreFailure{StoreFault::Refused, std::string("cannot be read: ") + std::strerror(errno) +
                                                 ": check owner and permissions of its folder"};
   }
   if (!S_ISREG(status.st_mode)) {
-    throw StoreFailure{StoreFault::Foreign, "is not a regular file: move it away"};
+    throw StoreFailure{StoreFault::Foreign, S_ISLNK(status.st_mode)
+                                                ? "is a symbolic link: move it away"
+                                                : "is not a regular file: move it away"};
   }
   return true;
 }

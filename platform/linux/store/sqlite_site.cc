@@ -8,6 +8,7 @@
 #include <unistd.h>
 
 #include "base/arithmetic.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/files/stamp.h"
 #include "platform/linux/store/second_look.h"
 #include "platform/statistics_store.h"
@@ -16,7 +17,7 @@ namespace tavrel {
 namespace {
 
 std::string folderOf(const std::string& path) {
-  return path.substr(0, path.rfind('/') + 1);
+  return path.substr(0, path.rfind('/'));
 }
 
 // A name for which neither the file nor its log files exist yet.
@@ -61,26 +62,17 @@ std::optional<FileVersion> FileVersion::of(const std::string& path) {
 }
 
 StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy) {
-  const std::string folder = folderOf(storePath);
-  descriptor_ = open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC);
-  if (descriptor_ < 0) {
-    throw StoreFailure{StoreFault::Refused, std::string("its folder cannot be opened: ") +
-                                                std::strerror(errno) +
-                                                ": check owner and permissions of the folder"};
-  }
-  while (flock(descriptor_, LOCK_EX | LOCK_NB) != 0) {
+  auto lock = FileSystem().openFolderLock(folderOf(storePath));
+  if (!lock) throw StoreFailure{StoreFault::Refused, lock.error().message};
+  descriptor_ = *std::move(lock);
+  while (flock(descriptor_.get(), LOCK_EX | LOCK_NB) != 0) {
     const int code = errno;
     if ((code != EWOULDBLOCK && code != EINTR) || !busy.wait()) {
-      close(descriptor_);
       throw StoreFailure{StoreFault::Busy,
                          std::string("its folder cannot be locked: ") + std::strerror(code) +
                              ": try again when the process that holds it has finished"};
     }
   }
-}
-
-StoreFolderLock::~StoreFolderLock() {
-  close(descriptor_);
 }
 
 std::string StoreSite::describe(const StoreFailure& failure) const {

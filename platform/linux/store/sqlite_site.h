@@ -10,6 +10,7 @@
 
 #include "base/expected.h"
 #include "platform/clock.h"
+#include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/sqlite_connection.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
@@ -42,17 +43,14 @@ struct FileVersion {
 };
 
 /// Held while the store's file is created or set aside, so that of several processes one does it.
-/// The lock is on the store's folder and goes with the process.
+/// The lock is the one of the store's folder and goes with the process.
 class StoreFolderLock {
  public:
   /// Throws `StoreFailure` when the lock cannot be taken in time.
   StoreFolderLock(const std::string& storePath, BusyBudget& busy);
-  ~StoreFolderLock();
-  StoreFolderLock(const StoreFolderLock&) = delete;
-  StoreFolderLock& operator=(const StoreFolderLock&) = delete;
 
  private:
-  int descriptor_;
+  Descriptor descriptor_;
 };
 
 /// The store's path, and the services to which failures are reported, which must outlive it.
