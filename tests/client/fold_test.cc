@@ -432,17 +432,32 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   std::sort(log.lines.begin(), log.lines.end());
   EXPECT_EQ(log.lines, expected);
   EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
+  std::filesystem::create_directories(folder / "fold-wanted/x");
+  EXPECT_EQ(foldNow().segmentsRefused, 1U);
+  EXPECT_EQ(log.lines.size(), 1U);
+  EXPECT_NE(log.lines.at(0).find("\"fold-wanted-"), std::string::npos) << log.lines.at(0);
+  EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
   report = foldNow();  // the copy is now alone and folded, as if it had been recorded
   EXPECT_EQ(report.segmentsRefused, 0U);
   EXPECT_EQ(log.lines, Lines());
   look();
-  EXPECT_EQ(figure("segments_refused"), 7);
+  EXPECT_EQ(figure("segments_refused"), 8);
 
   for (int i = 0; i < 200; ++i)
     put(std::to_string(i).c_str(), 0);
   EXPECT_EQ(foldNow().segmentsRefused, 200U);
-  EXPECT_EQ(log.lines.size(), 100U - 7 + 1);  // with those of the fold before
-  EXPECT_EQ(log.lines.back(), "107 more refusals of this fold are not listed");
+  EXPECT_EQ(log.lines.size(), 100U - 8 + 1);  // with those of the folds before
+  EXPECT_EQ(log.lines.back(), "108 more refusals of this fold are not listed");
+
+  // Once others have taken all room to remember them, they count each time.
+  std::ofstream told(root / "run/tavrel/fold.lock");
+  for (std::uint64_t i = 0; i < 8192; ++i)
+    told.write(reinterpret_cast<const char*>(&i), sizeof i);
+  told.close();
+  for (int time = 0; time < 2; ++time) {
+    EXPECT_EQ(foldNow().segmentsRefused, 207U);
+    EXPECT_EQ(log.lines, Lines());
+  }
 }
 
 TEST_F(FoldTest, RandomBytesDoNoHarm) {

@@ -13,6 +13,7 @@ namespace {
 constexpr std::string_view kLockPath = "/run/tavrel/fold.lock";
 
 // Lines that are remembered. Those beyond `limits::kFoldRefusalLines` only to count each once.
+// Those that find no room here count in each fold.
 constexpr std::size_t kRemembered = 8192;
 
 }  // namespace
@@ -32,8 +33,10 @@ FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), 
 }
 
 bool FoldNotes::tell(std::string_view line) {
-  const auto digest = sha256(asBytes(line));
-  if (told_.size() >= kRemembered || !told_.insert(*loadLittle64(digest, 0)).second) return false;
+  const std::uint64_t digest = *loadLittle64(sha256(asBytes(line)), 0);
+  if (told_.contains(digest)) return false;
+  if (told_.size() >= kRemembered) return true;
+  told_.insert(digest);
   hasChanged_ = true;
   if (told_.size() <= limits::kFoldRefusalLines) {
     log_.write(LogLevel::Error, line);

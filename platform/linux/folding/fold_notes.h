@@ -24,7 +24,8 @@ class FoldNotes {
   /// notes.
   static Expected<FoldNotes> lock(const DeviceRoot& root, FileSystem& files, SystemLog& log);
 
-  /// Writes a line to the log unless it was told before or is one too many. True when it is new.
+  /// Writes a line to the log unless it was told before or is one too many. True when it is new, or
+  /// when too many were told to know.
   bool tell(std::string_view line);
 
   /// Marks that a transaction has taken values. Comes before the segments lose them.

@@ -299,13 +299,12 @@ FoldReport SegmentFold::run() {
   const Expected<SegmentFolder::Listing> listing = (*folder)->list();
   if (!listing) {
     report.failure = listing.error().message;
-    return report;
-  }
-  if (listing->segments.empty() && listing->refusals.empty()) return report;
-  const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
-  if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(*listing);
-      !done) {
-    report.failure = done.error().message + "; what programs recorded waits for the next fold";
+  } else if (!listing->segments.empty() || !listing->refusals.empty()) {
+    const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
+    if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(*listing);
+        !done) {
+      report.failure = done.error().message + "; what programs recorded waits for the next fold";
+    }
   }
   notes->save();
   return report;

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdio>
 #include <dirent.h>
 #include <fcntl.h>
 #include <linux/magic.h>
@@ -13,6 +14,7 @@
 
 #include "base/limits.h"
 #include "base/text.h"
+#include "platform/linux/files/random.h"
 #include "platform/linux/files/system_error.h"
 
 namespace tavrel {
@@ -192,9 +194,12 @@ std::string SegmentFolder::refusal(std::string_view name, std::string_view reaso
 
 Status SegmentFolder::clearRequest() const {
   if (unlinkat(folder_.get(), kRequest, 0) == 0 || errno == ENOENT) return Done{};
-  // Anybody may make a folder of that name.
+  // Anybody may make a folder of that name. One with something in it gets another name, under which
+  // it is refused as other files are: as a request it would have folds follow each other for ever.
   const int code = errno;
   if (unlinkat(folder_.get(), kRequest, AT_REMOVEDIR) == 0) return Done{};
+  const std::string aside = std::string(kRequest) + "-" + randomName();
+  if (renameat(folder_.get(), kRequest, folder_.get(), aside.c_str()) == 0) return Done{};
   return systemError("remove", path_ + "/" + kRequest, code);
 }
 
