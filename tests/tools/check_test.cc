@@ -128,6 +128,9 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   device.run({"prefs", "set", "com.norvane.tallied.tavrel", "--int",
               "LastCrashLogSerializationDateInDaysSince1970", std::to_string(today())});
   expect("WARNING clock: today is day", 1);
+  device.run({"prefs", "set", "com.norvane.tallied.tavrel", "--int",
+              "LastCrashLogSerializationDateInDaysSince1970", std::to_string(today() + 2)});
+  expect("CRITICAL clock: today is day", 2);
 }
 
 TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {

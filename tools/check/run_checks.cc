@@ -122,6 +122,12 @@ void checkClock(CheckScene& scene) {
   if (scene.today < TAVREL_BUILD_DAY) {
     check.state = CheckState::Critical;
     check.text += ", before this program was built: set the clock";
+  } else if (hasRun && std::int64_t{lastDay} > std::int64_t{scene.today} + 1) {
+    check.state = CheckState::Critical;
+    check.text += format(
+        ", and day %s counts as reported: no run comes before then. A tasking or a clock that was "
+        "ahead set it: see which, then 'tavrelctl prefs delete %s %s'",
+        dayText(lastDay), kTavrelDomain, kLastRunDayKey);
   } else if (hasRun && lastDay >= scene.today) {
     check.state = CheckState::Warning;
     check.text += format(
