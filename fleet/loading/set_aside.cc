@@ -4,12 +4,12 @@
 #include <string_view>
 #include <utility>
 
-#include "base/format.h"
 #include "base/text.h"
 #include "fleet/logs/limits.h"
 #include "fleet/logs/record_digest.h"
 #include "fleet/sources/file_name.h"
 #include "fleet/sources/sources.h"
+#include "tools/shared/table.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -45,7 +45,8 @@ Status SetAside::keep(const SourceItem& refused) {
   if (!bytes.empty()) {
     if (Status done = files_.replace(path, asBytes(bytes), kMode); !done) return done;
   }
-  const std::string reason = format("%s: %s\n", refused.name, refused.reason);
+  // For a terminal, too.
+  const std::string reason = printable(refused.name + ": " + refused.reason) + '\n';
   return files_.replace(path + ".reason", asBytes(reason), kMode);
 }
 

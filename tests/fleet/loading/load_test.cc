@@ -191,6 +191,7 @@ TEST_F(LoadTest, TakesArchives) {
 TEST_F(LoadTest, SetsAsideWhatItRefuses) {
   write("in/good.log", sampleLog(1));
   write("in/bad.log", "nonsense");
+  write("in/b\x1b\n.log", "nonsense");
   write("in/sub/empty.log", "");
   std::filesystem::create_symlink("good.log", at("in/link.log"));
   std::filesystem::create_directory_symlink(at("in"), at("in/sub/loop"));
@@ -198,6 +199,7 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
   for (int time = 0; time < 2; ++time) {
     const Outcome outcome = run({at("in"), at("none.log"), "--set-aside", at("aside/deep")});
     EXPECT_EQ(outcome.error,
+              "tavrel-fleet: refused: in/b\\x1b\\n.log: is not a property list\n"
               "tavrel-fleet: refused: in/bad.log: is not a property list\n"
               "tavrel-fleet: skipped: in/link.log: is a symbolic link\n"
               "tavrel-fleet: skipped: in/pipe.log: is not a regular file\n"
@@ -210,6 +212,8 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
     kept[file.path().filename().string().substr(17)] = withoutFolder(contentOf(file.path()));
   EXPECT_EQ(kept,
             (std::map<std::string, std::string>{
+                {"b__.log", "nonsense"},
+                {"b__.log.reason", "in/b\\x1b\\n.log: is not a property list\n"},
                 {"bad.log", "nonsense"},
                 {"bad.log.reason", "in/bad.log: is not a property list\n"},
                 {"empty.log.reason", "in/sub/empty.log: is empty\n"},
