@@ -53,11 +53,27 @@ struct Connection::Transfer {
 };
 
 Connection::Connection(const Configuration& configuration)
-    : configuration_(configuration), handle_(nullptr, curl_easy_cleanup) {
+    : configuration_(configuration),
+      shared_(nullptr, [](void* share) { curl_share_cleanup(share); }) {
   if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
-  handle_.reset(curl_easy_init());
-  CURL* const handle = handle_.get();
+  shared_.reset(curl_share_init());
+  if (!shared_ ||
+      curl_share_setopt(shared_.get(), CURLSHOPT_SHARE, CURL_LOCK_DATA_CONNECT) != CURLSHE_OK) {
+    throw std::bad_alloc();
+  }
+}
+
+Connection::~Connection() {
+  shared_.reset();
+  curl_global_cleanup();
+}
+
+Connection::Handle Connection::newHandle() const {
+  const Configuration& configuration = configuration_;
+  Handle owned(curl_easy_init(), curl_easy_cleanup);
+  CURL* const handle = owned.get();
   if (handle == nullptr) throw std::bad_alloc();
+  set(handle, CURLOPT_SHARE, shared_.get());
   // A look-up of a name that hangs is left behind, not waited for.
   set(handle, CURLOPT_QUICK_EXIT, 1L);
   set(handle, CURLOPT_PROTOCOLS_STR, configuration.mayBePlain ? "https,http" : "https");
@@ -80,17 +96,12 @@ Connection::Connection(const Configuration& configuration)
   set(handle, CURLOPT_WRITEFUNCTION, Transfer::takeBody);
   set(handle, CURLOPT_XFERINFOFUNCTION, Transfer::progress);
   set(handle, CURLOPT_NOPROGRESS, 0L);
-}
-
-Connection::~Connection() {
-  handle_.reset();
-  curl_global_cleanup();
+  return owned;
 }
 
 Expected<Answer> Connection::put(const std::string& url, const std::vector<std::string>& headers,
                                  std::string_view body, std::chrono::milliseconds longest,
                                  const GoOn& goOn) {
-  CURL* const handle = handle_.get();
   std::unique_ptr<curl_slist, void (*)(curl_slist*)> list(nullptr, curl_slist_free_all);
   const auto add = [&](const std::string& header) {
     curl_slist* const longer = curl_slist_append(list.get(), header.c_str());
@@ -105,6 +116,8 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
 
   Transfer transfer{goOn, std::chrono::steady_clock::now()};
   std::array<char, CURL_ERROR_SIZE> words{};
+  const Handle owned = newHandle();
+  CURL* const handle = owned.get();
   set(handle, CURLOPT_URL, url.c_str());
   set(handle, CURLOPT_HTTPHEADER, list.get());
   set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
@@ -114,7 +127,6 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
   set(handle, CURLOPT_XFERINFODATA, &transfer);
   set(handle, CURLOPT_ERRORBUFFER, words.data());
   const CURLcode code = curl_easy_perform(handle);
-  set(handle, CURLOPT_ERRORBUFFER, static_cast<char*>(nullptr));
   isMisconfigured_ = code == CURLE_SSL_CERTPROBLEM || code == CURLE_SSL_CACERT_BADFILE;
   if (transfer.answerBytes > limits::kUploadAnswerBytes) return Error{"the answer is too long"};
   if (code != CURLE_OK) return Error{words[0] != '\0' ? words.data() : curl_easy_strerror(code)};

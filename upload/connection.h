@@ -48,8 +48,14 @@ class Connection {
 
  private:
   struct Transfer;
+  using Handle = std::unique_ptr<void, void (*)(void*)>;
+  Handle newHandle() const;
+
   const Configuration& configuration_;
-  std::unique_ptr<void, void (*)(void*)> handle_;
+  // What transfers share: the connection. Each has a handle of its own, because libcurl 7.88, used
+  // again, takes a folded line at the beginning of an answer's headers for part of the last
+  // header of the answer before, which it has freed.
+  std::unique_ptr<void, void (*)(void*)> shared_;
   bool isMisconfigured_ = false;
 };
 

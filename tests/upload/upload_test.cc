@@ -133,6 +133,22 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
   EXPECT_EQ(device.names(), Lines{nameOf(1) + ".log"});
 }
 
+// libcurl 7.88 takes the line for part of a header that it has freed, when a handle is used again.
+TEST(Upload, AFoldedLineBelongsToNoEarlierAnswer) {
+  Device device;
+  device.add(nameOf(1));
+  device.add(nameOf(2));
+  int requests = 0;
+  ScriptedServer server([&](const std::string&) {
+    return ++requests == 1 ? kOk
+                           : "HTTP/1.1 201 Created\r\n folded: x\r\nContent-Length: 0\r\n\r\n";
+  });
+  EXPECT_EQ(device.runAgainst(server), Outcome::Waits);
+  EXPECT_EQ(requests, 2);
+  EXPECT_EQ(device.state().sent, 1);
+  EXPECT_EQ(device.names(), (Lines{nameOf(2) + ".log", nameOf(2) + ".metadata.plist"}));
+}
+
 TEST(Upload, GivesUpWhatTheServerRefusesAndKeepsTheNewest) {
   Device device;
   for (int number = 0; number < 20; ++number)

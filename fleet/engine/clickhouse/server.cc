@@ -96,11 +96,26 @@ struct Server::Transfer {
 };
 
 Server::Server(ServerAddress address)
-    : address_(std::move(address)), handle_(nullptr, curl_easy_cleanup) {
+    : address_(std::move(address)),
+      shared_(nullptr, [](void* share) { curl_share_cleanup(share); }) {
   if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
-  handle_.reset(curl_easy_init());
-  CURL* const handle = handle_.get();
+  shared_.reset(curl_share_init());
+  if (!shared_ ||
+      curl_share_setopt(shared_.get(), CURLSHOPT_SHARE, CURL_LOCK_DATA_CONNECT) != CURLSHE_OK) {
+    throw std::bad_alloc();
+  }
+}
+
+Server::~Server() {
+  shared_.reset();
+  curl_global_cleanup();
+}
+
+Server::Handle Server::newHandle() const {
+  Handle owned(curl_easy_init(), curl_easy_cleanup);
+  CURL* const handle = owned.get();
   if (handle == nullptr) throw std::bad_alloc();
+  set(handle, CURLOPT_SHARE, shared_.get());
   set(handle, CURLOPT_NOSIGNAL, 1L);
   set(handle, CURLOPT_PROTOCOLS_STR, "http,https");
   set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
@@ -120,11 +135,7 @@ Server::Server(ServerAddress address)
   set(handle, CURLOPT_TIMEOUT, static_cast<long>(address_.timeout.count()));
   set(handle, CURLOPT_POST, 1L);
   set(handle, CURLOPT_WRITEFUNCTION, Transfer::receive);
-}
-
-Server::~Server() {
-  handle_.reset();
-  curl_global_cleanup();
+  return owned;
 }
 
 // With this setting the server sends nothing before the statement has ended. Otherwise it would
@@ -154,9 +165,10 @@ void Server::refuse(std::string_view answer, long status) const {
 
 void Server::perform(const std::string& url, std::string_view body, bool isRepeatable,
                      const std::function<void(std::string_view)>& take) {
-  CURL* const handle = handle_.get();
-  Transfer transfer{handle, take, {}, {}};
   std::array<char, CURL_ERROR_SIZE> words{};
+  const Handle owned = newHandle();
+  CURL* const handle = owned.get();
+  Transfer transfer{handle, take, {}, {}};
   set(handle, CURLOPT_URL, url.c_str());
   set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
   set(handle, CURLOPT_POSTFIELDS, body.data());
@@ -166,7 +178,6 @@ void Server::perform(const std::string& url, std::string_view body, bool isRepea
   // answer.
   set(handle, CURLOPT_FRESH_CONNECT, isRepeatable ? 0L : 1L);
   const CURLcode code = curl_easy_perform(handle);
-  set(handle, CURLOPT_ERRORBUFFER, static_cast<char*>(nullptr));
   if (transfer.failure) std::rethrow_exception(transfer.failure);
   if (code != CURLE_OK) {
     const std::string text =

@@ -52,7 +52,9 @@ class Server {
 
  private:
   struct Transfer;
+  using Handle = std::unique_ptr<void, void (*)(void*)>;
 
+  Handle newHandle() const;
   void perform(const std::string& url, std::string_view body, bool isRepeatable,
                const std::function<void(std::string_view)>& take);
   std::string urlWith(const std::string& statement) const;
@@ -60,7 +62,10 @@ class Server {
 
   ServerAddress address_;
   std::string database_;
-  std::unique_ptr<void, void (*)(void*)> handle_;
+  // The connection, which requests share. Each has a handle of its own, because libcurl 7.88, used
+  // again, takes a folded line at the beginning of an answer's headers for part of the last
+  // header of the answer before, which it has freed.
+  std::unique_ptr<void, void (*)(void*)> shared_;
 };
 
 /// `text` as a literal of the query language.
