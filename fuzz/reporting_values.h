@@ -2,22 +2,42 @@
 // legends, and everything that can be asked of them.
 #pragma once
 
-#include <cstdlib>
+#include <span>
 #include <string>
 #include <string_view>
 
 #include "ioreport/ioreport.h"
+#include "require.h"
 
 namespace tavrel::fuzz {
 
-inline void require(bool holds) {
-  if (!holds) std::abort();
-}
+/// The keys of aggregates, of channels and of samples.
+inline constexpr std::string_view kReportingKeys[] = {"QueryOpts",
+                                                      "IOReportChannels",
+                                                      "IOReportDrivers",
+                                                      "IOReportChannelGroups",
+                                                      "IOReportChannels",
+                                                      "DriverID",
+                                                      "DriverName",
+                                                      "LegendChannel",
+                                                      "IOReportGroupName",
+                                                      "IOReportSubGroupName",
+                                                      "IOReportChannelInfo",
+                                                      "IOReportChannelUnit",
+                                                      "IOReportChannelConfig",
+                                                      "ChannelName",
+                                                      "UnitLabel",
+                                                      "StateNames",
+                                                      "ProcessedChannelConfig",
+                                                      "RawElements",
+                                                      "a",
+                                                      "b"};
 
 /// Takes values off the front of the input, nulls at its end.
 class ValueReader {
  public:
-  explicit ValueReader(ByteSpan input) : rest_(input) {}
+  explicit ValueReader(ByteSpan input, std::span<const std::string_view> keys = kReportingKeys)
+      : rest_(input), keys_(keys) {}
 
   std::uint64_t word(std::size_t bytes) {
     std::uint64_t taken = 0;
@@ -60,29 +80,9 @@ class ValueReader {
   }
 
   plist::Dictionary dictionary(int depth) {
-    static constexpr std::string_view kKeys[] = {"QueryOpts",
-                                                 "IOReportChannels",
-                                                 "IOReportDrivers",
-                                                 "IOReportChannelGroups",
-                                                 "IOReportChannels",
-                                                 "DriverID",
-                                                 "DriverName",
-                                                 "LegendChannel",
-                                                 "IOReportGroupName",
-                                                 "IOReportSubGroupName",
-                                                 "IOReportChannelInfo",
-                                                 "IOReportChannelUnit",
-                                                 "IOReportChannelConfig",
-                                                 "ChannelName",
-                                                 "UnitLabel",
-                                                 "StateNames",
-                                                 "ProcessedChannelConfig",
-                                                 "RawElements",
-                                                 "a",
-                                                 "b"};
     plist::Dictionary made = plist::Dictionary::create();
     for (std::uint64_t count = word(1) % 8; count > 0 && !rest_.empty(); --count) {
-      const std::string_view key = kKeys[word(1) % std::size(kKeys)];
+      const std::string_view key = keys_[word(1) % keys_.size()];
       made.set(key, value(depth + 1));
     }
     return made;
@@ -116,6 +116,7 @@ class ValueReader {
   }
 
   ByteSpan rest_;
+  std::span<const std::string_view> keys_;
 };
 
 /// Asks a channel everything.

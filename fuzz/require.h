@@ -1,0 +1,12 @@
+// The one check of all targets: what does not hold is a finding.
+#pragma once
+
+#include <cstdlib>
+
+namespace tavrel::fuzz {
+
+inline void require(bool holds) {
+  if (!holds) std::abort();
+}
+
+}  // namespace tavrel::fuzz
