@@ -105,6 +105,22 @@ class StoreTest : public testing::Test, protected DeviceServices {
   std::unique_ptr<SqliteStore> store_ = open();
 };
 
+TEST_F(StoreTest, AWalkEndsWhateverTheDaysAre) {
+  set({{"a", kToday, 1}});
+  // As a damaged page may have it.
+  sql("DROP TABLE scalars;"
+      "CREATE TABLE scalars (day, key, value, PRIMARY KEY (day, key)) WITHOUT ROWID;"
+      "INSERT INTO scalars VALUES (0, x'62', 1), (1.5, x'41', 2), (3, x'61', 4)");
+  const auto history = store_->openHistory();
+  ASSERT_TRUE(history);
+  Rows rows;
+  ASSERT_TRUE((*history)->walkScalar(
+      "a", 0, 9, [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
+        rows.push_back({std::string(key), day, value});
+      }));
+  EXPECT_EQ(rows, (Rows{{"a", 3, 4}}));
+}
+
 TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
   const std::string nul("a\0b", 3);
   const std::string longKey(100'000, 'k');

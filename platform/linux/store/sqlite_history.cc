@@ -85,10 +85,11 @@ void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDa
     next.bind(3, lastDay);
     if (!next.step()) break;
     const std::string_view found = next.bytes(0);
-    day = next.integer(1);
+    const std::int64_t asked = std::exchange(day, next.integer(1));
     if (found == key) handle(stop);
-    // A later day that begins with a lower key may still have this one.
-    if (found >= key) ++day;
+    // A later day that begins with a lower key may still have this one. In a damaged store a day is
+    // not always an integer, and may not seem to be later.
+    if (found >= key || day <= asked) day = std::max(day, asked) + 1;
     next.reset();
   }
   next.reset();
