@@ -1,73 +1,78 @@
-// The kernel's texts: names, numbers, tables and interrupts, through a tree of files.
-#include <cstddef>
-#include <cstdint>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
-#include <string>
+// The kernel's texts behind report channels: names, numbers, tables and interrupts, through a tree
+// of files that holds nothing of earlier inputs. Each channel of a legend is known, and the values
+// of all fit into the room that was named for them; so they do once a file is empty.
+//
+// Input: the number of a file and its content, with 0xFF behind it, again and again.
+#include <array>
+#include <optional>
+#include <utility>
+#include <vector>
 
 #include "platform/linux/live/kernel_text.h"
 #include "platform/linux/live/live_machine.h"
 #include "platform/report_protocol.h"
+#include "support.h"
 
 namespace {
 
 using namespace tavrel;
+using fuzz::require;
 
-class Silent final : public SystemLog {
- public:
-  void write(LogLevel, std::string_view) override {}
+struct File {
+  const char* path;
+  const char* content;  // when the input does not say
+};
+// New ones go to the end: inputs hold the numbers.
+constexpr File kFiles[] = {
+    {"/proc/stat", ""},
+    {"/proc/interrupts", ""},
+    {"/proc/diskstats", ""},
+    {"/proc/net/dev", ""},
+    {"/proc/pressure/io", ""},
+    {"/proc/vmstat", ""},
+    {"/sys/class/devfreq/a/trans_stat", ""},
+    {"/sys/class/thermal/cooling_device0/stats/time_in_state_ms", "state0\t1\nstate1\t2\n"},
+    {"/sys/class/thermal/cooling_device0/stats/trans_table", ""},
+    {"/sys/class/hwmon/hwmon0/name", ""},
+    {"/sys/block/zram0/mm_stat", ""},
+    {"/sys/power/suspend_stats/success", ""},
+    {"/proc/softirqs", ""},
+    {"/proc/schedstat", ""},
+    {"/proc/meminfo", ""},
+    {"/proc/swaps", ""},
+    {"/proc/uptime", ""},
+    {"/sys/devices/system/cpu/cpu0/cpuidle/state0/name", "C1"},
+    {"/sys/devices/system/cpu/cpu0/cpuidle/state0/time", "7"},
+    {"/sys/devices/system/cpu/cpufreq/policy0/stats/time_in_state", "1800000 5\n"},
+    {"/sys/devices/system/cpu/cpufreq/policy0/stats/trans_table", ""},
+    {"/sys/devices/system/edac/mc/mc0/ce_count", ""},
+    {"/sys/devices/system/edac/mc/mc0/dimm0/dimm_label", ""},
+    {"/sys/class/thermal/thermal_zone0/type", ""},
+    {"/sys/class/thermal/thermal_zone0/temp", "40000"},
+    {"/sys/class/hwmon/hwmon0/in0_input", "1"},
+    {"/sys/class/hwmon/hwmon0/in0_label", ""},
+    {"/sys/fs/cgroup/cgroup.controllers", ""},
+    {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
+    {"/sys/fs/cgroup/a.slice/cpu.stat", ""},
+    {"/sys/fs/cgroup/a.slice/memory.current", ""},
 };
 
-// The first byte of the input chooses the file.
-constexpr const char* kFiles[] = {
-    "/proc/stat",
-    "/proc/interrupts",
-    "/proc/diskstats",
-    "/proc/net/dev",
-    "/proc/pressure/io",
-    "/proc/vmstat",
-    "/sys/class/devfreq/a/trans_stat",
-    "/sys/class/thermal/cooling_device0/stats/time_in_state_ms",
-    "/sys/class/thermal/cooling_device0/stats/trans_table",
-    "/sys/class/hwmon/hwmon0/name",
-    "/sys/block/zram0/mm_stat",
-    "/sys/power/suspend_stats/success",
-};
-
-class Tree {
+// Files that have their content already are left alone: most do, from input to input.
+class Files {
  public:
-  Tree() {
-    if (!mkdtemp(folder_.data())) std::abort();
-    for (const char* const file : kFiles)
-      std::filesystem::create_directories(std::filesystem::path(folder_ + file).parent_path());
-    std::ofstream(folder_ + "/sys/class/hwmon/hwmon0/in0_input") << "1";
-    std::ofstream(folder_ + "/sys/class/thermal/cooling_device0/stats/time_in_state_ms")
-        << "state0\t1\nstate1\t2\n";
+  void write(std::size_t file, const std::string& content) {
+    if (written_[file] == content) return;
+    tree.write(kFiles[file].path, content);
+    written_[file] = content;
   }
-  ~Tree() { std::filesystem::remove_all(folder_); }
-  Tree(const Tree&) = delete;
-  Tree& operator=(const Tree&) = delete;
-
-  const std::string& folder() const { return folder_; }
+  fuzz::Tree tree;
 
  private:
-  std::string folder_ = "/dev/shm/live-fuzz-XXXXXX";
+  std::array<std::optional<std::string>, std::size(kFiles)> written_;
 };
 
-}  // namespace
-
-extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  static const Tree tree;
-  if (size == 0) return 0;
-  const std::string text(reinterpret_cast<const char*>(data) + 1, size - 1);
-  const std::string path = tree.folder() + kFiles[data[0] % std::size(kFiles)];
-  std::ofstream(path) << text;
-
-  const DeviceRoot root(tree.folder());
-  Silent log;
-  LiveMachine machine(root, log);
-  const auto sampling = machine.subscribe();
+// The bytes of the largest channel and the number of all.
+std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling& sampling) {
   std::size_t count = 0;
   std::size_t largest = kElementBytes;
   for (const plist::Value& service : machine.services()) {
@@ -77,21 +82,49 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       for (const plist::Value& channel : group.dictionary().array("IOReportChannels")) {
         const auto id = channel.array().at(0).number()->int64();
         const std::size_t bytes =
-            sampling->add(static_cast<std::uint64_t>(driver), static_cast<std::uint64_t>(id));
-        if (bytes == 0) std::abort();  // every channel of a legend is known
+            sampling.add(static_cast<std::uint64_t>(driver), static_cast<std::uint64_t>(id));
+        require(bytes > 0 && bytes % kElementBytes == 0);
         largest = std::max(largest, bytes);
         ++count;
       }
     }
   }
-  sampling->update();
+  return {largest, count};
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  fuzz::Input input(data, size);
+  std::array<std::string, std::size(kFiles)> contents;
+  for (std::size_t i = 0; i < contents.size(); ++i)
+    contents[i] = kFiles[i].content;
+  std::size_t last = 0;
+  while (!input.empty()) {
+    last = input.byte() % contents.size();
+    contents[last] = input.part();
+  }
+  static Files files;
+  for (std::size_t i = 0; i < contents.size(); ++i)
+    files.write(i, contents[i]);
+
+  fuzz::SilentLog log;
+  LiveMachine machine(files.tree.root, log);
+  const auto sampling = machine.subscribe();
+  const auto [largest, count] = subscribe(machine, *sampling);
   std::vector<std::byte> room(largest);
-  for (std::size_t i = 0; i < count; ++i)
-    sampling->write(i, room);
-  std::filesystem::resize_file(path, 0);
-  sampling->update();
-  std::string_view rest = text;
-  while (!rest.empty())
-    live::channelName(live::takeLine(rest));
+  for (const bool isEmptied : {false, true}) {
+    if (isEmptied) files.write(last, "");
+    sampling->update();
+    for (std::size_t i = 0; i < count; ++i) {
+      const std::size_t written = sampling->write(i, room);
+      require(written <= room.size() && written % kElementBytes == 0);
+    }
+  }
+  for (std::string_view rest = contents[last]; !rest.empty();) {
+    const std::string name = live::channelName(live::takeLine(rest));
+    for (const char c : name)
+      require(c > ' ' && c <= '~');
+  }
   return 0;
 }
