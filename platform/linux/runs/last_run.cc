@@ -1,10 +1,10 @@
 #include "platform/linux/runs/last_run.h"
 
 #include <algorithm>
-#include <charconv>
 #include <unistd.h>
 
 #include "base/limits.h"
+#include "platform/linux/files/process_stat.h"
 #include "platform/plist/coding.h"
 
 namespace tavrel {
@@ -23,17 +23,10 @@ std::string bootOfMachine() {
   return kernelText("/proc/sys/kernel/random/boot_id");
 }
 
-// The 22nd field of a process's stat; 0 when there is no such process. The second field is the
-// program's name in parentheses, which may hold anything.
+// 0 when there is no such process.
 std::int64_t startOf(std::int64_t process) {
   const std::string stat = kernelText("/proc/" + std::to_string(process) + "/stat");
-  std::size_t at = stat.rfind(')');
-  for (int field = 2; at != std::string::npos && field < 22; ++field)
-    at = stat.find(' ', at + 1);
-  if (at == std::string::npos) return 0;
-  std::int64_t started = 0;
-  std::from_chars(stat.data() + at + 1, stat.data() + stat.size(), started);
-  return started;
+  return static_cast<std::int64_t>(startInStat(stat).value_or(0));
 }
 
 std::optional<std::int64_t> integerIn(const plist::Dictionary& entries, std::string_view key) {

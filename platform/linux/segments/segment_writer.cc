@@ -1,7 +1,6 @@
 #include "platform/linux/segments/segment_writer.h"
 
 #include <cerrno>
-#include <charconv>
 #include <csignal>
 #include <fcntl.h>
 #include <string>
@@ -9,13 +8,13 @@
 #include <unistd.h>
 
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/process_stat.h"
 
 namespace tavrel {
 namespace {
 
 enum class Lookup : unsigned char { Found, Absent, Failed };
 
-// Field 22 of /proc/PID/stat. The second one is the program's name in parentheses.
 Lookup startOf(std::uint32_t pid, std::uint64_t& start) {
   const std::string path = "/proc/" + std::to_string(pid) + "/stat";
   const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
@@ -23,15 +22,10 @@ Lookup startOf(std::uint32_t pid, std::uint64_t& start) {
   char text[1024];
   const ssize_t length = ::read(file.get(), text, sizeof text);
   if (length < 0) return errno == ESRCH ? Lookup::Absent : Lookup::Failed;
-  std::string_view rest(text, static_cast<std::size_t>(length));
-  rest.remove_prefix(std::min(rest.rfind(')'), rest.size()));
-  for (int field = 2; field < 22; ++field) {
-    const std::size_t space = rest.find(' ');
-    if (space == std::string_view::npos) return Lookup::Failed;
-    rest.remove_prefix(space + 1);
-  }
-  const auto [end, error] = std::from_chars(rest.data(), rest.data() + rest.size(), start);
-  return error == std::errc{} ? Lookup::Found : Lookup::Failed;
+  const auto found = startInStat({text, static_cast<std::size_t>(length)});
+  if (!found) return Lookup::Failed;
+  start = *found;
+  return Lookup::Found;
 }
 
 }  // namespace
