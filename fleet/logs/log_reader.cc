@@ -64,6 +64,14 @@ Expected<LogRecord> LogReader::read(ByteSpan bytes, const LogMetadata* metadata)
   record.scalars.reserve(scalars_);
   record.distributions.reserve(distributions_);
   record.cells.reserve(cells_);
+  if (metadata != nullptr) {
+    for (const std::string* const text :
+         {&metadata->osVersion, &metadata->previousOsVersion, &metadata->configNumber}) {
+      if (text->size() > limits::kTextBytes) {
+        return Error{format("its metadata has a text of more than %zu bytes", limits::kTextBytes)};
+      }
+    }
+  }
   std::string fault = readDocument(bytes, record);
   if (!fault.empty()) return Error{std::move(fault)};
   scalars_ = record.scalars.size();

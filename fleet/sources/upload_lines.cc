@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cerrno>
+#include <cstdint>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <utility>
@@ -33,7 +34,7 @@ bool UploadLines::add(std::string_view line) {
   if (!object.is_object()) return false;
   const auto status = object.find("status");
   if (status == object.end() || !status->is_number_integer()) return false;
-  const int code = status->get<int>();
+  const auto code = status->get<std::int64_t>();
   if (code != 200 && code != 201 && code != 204) return false;
   const std::string log = textOf(object, "log");
   if (log.empty()) return false;

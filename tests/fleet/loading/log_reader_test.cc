@@ -93,6 +93,9 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
     EXPECT_EQ(record->digest, *digest);
   }
   EXPECT_EQ(reader.read(asBytes(kSampleLog), nullptr)->digest, *digest);
+  metadata.configNumber.assign(4097, '7');
+  EXPECT_EQ(reader.read(asBytes(kSampleLog), &metadata).error().message,
+            "its metadata has a text of more than 4096 bytes");
 }
 
 TEST(LogReaderTest, TellsLogsApartByAllThatTheySay) {
