@@ -4,6 +4,7 @@
 #include <sqlite3.h>
 #include <thread>
 
+#include "fleet/engine/clickhouse/clickhouse_reading.h"
 #include "fleet/engine/open/open_engine.h"
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
@@ -184,6 +185,20 @@ TEST(EngineFaults, SpeaksTlsWithWhomItMay) {
   EXPECT_THAT(openingFailure(where), HasSubstr("SSL certificate problem"));
   EXPECT_THAT(openingFailure(where + "&ca-file=" + proxy.folder + "ca.crt"),
               HasSubstr("/d: the server answered with status 400"));
+}
+
+TEST(EngineFaults, BoundsARow) {
+  const ScriptedServer answering([](const std::string&) {
+    const std::string row = std::string("\0\xFF\xFF\xFF\x7F", 5) + std::string(2 << 20, 'x');
+    return "HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(row.size()) + "\r\n\r\n" + row;
+  });
+  ServerAddress address;
+  address.name = "server";
+  address.url = answering.url();
+  Server server(address);
+  EXPECT_EQ(failureOf([&] { ClickhouseReading(server).keys(); }),
+            "server: a row has more than 1048576 bytes: the tables are not those of this program; "
+            "check the address");
 }
 
 TEST(EngineFaults, BoundsItsPatience) {

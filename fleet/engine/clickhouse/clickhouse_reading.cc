@@ -9,6 +9,9 @@
 namespace tavrel::fleet {
 namespace {
 
+// Far more than the texts of a row have together.
+constexpr std::size_t kLargestRow = 1U << 20;
+
 // Rows of fixed or varying size from pieces of an answer. `parse` is false when bytes of the row
 // are still to come.
 template <class Row, class Parse>
@@ -29,6 +32,11 @@ void readRows(Server& server, const std::string& statement, const Visitor<Row>& 
       rows.push_back(row);
     if (!rows.empty()) visit(rows);
     rows.clear();
+    if (left > kLargestRow) {
+      throw EngineError(server.address().name + ": a row has more than " +
+                        std::to_string(kLargestRow) +
+                        " bytes: the tables are not those of this program; check the address");
+    }
     rest = piece.substr(piece.size() - left);
   });
   if (!rest.empty())
