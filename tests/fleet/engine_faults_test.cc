@@ -4,7 +4,6 @@
 #include <sqlite3.h>
 #include <thread>
 
-#include "fleet/engine/clickhouse/clickhouse_reading.h"
 #include "fleet/engine/open/open_engine.h"
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
@@ -187,20 +186,6 @@ TEST(EngineFaults, SpeaksTlsWithWhomItMay) {
               HasSubstr("/d: the server answered with status 400"));
 }
 
-TEST(EngineFaults, BoundsARow) {
-  const ScriptedServer answering([](const std::string&) {
-    const std::string row = std::string("\0\xFF\xFF\xFF\x7F", 5) + std::string(2 << 20, 'x');
-    return "HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(row.size()) + "\r\n\r\n" + row;
-  });
-  ServerAddress address;
-  address.name = "server";
-  address.url = answering.url();
-  Server server(address);
-  EXPECT_EQ(failureOf([&] { ClickhouseReading(server).keys(); }),
-            "server: a row has more than 1048576 bytes: the tables are not those of this program; "
-            "check the address");
-}
-
 TEST(EngineFaults, BoundsItsPatience) {
   int requests = 0;
   std::string answer;
@@ -235,6 +220,38 @@ TEST(EngineFaults, BoundsItsPatience) {
   server.closesAfterAnswer = true;
   expect("", "transfer closed with 8 bytes remaining to read: the answer is incomplete; ask again",
          1);
+}
+
+TEST(EngineFaults, TakesRowsOnlyWhole) {
+  std::string body = "1\n";
+  ScriptedServer server([&](const std::string&) {
+    return "HTTP/1.1 200 OK\r\nContent-Length: " + std::to_string(body.size()) + "\r\n\r\n" + body;
+  });
+  std::string name = server.url();
+  name = "clickhouse" + name.substr(4, name.rfind('/') - 3) + "d";
+  const auto engine = openEngine(name, OpenMode::kRead);
+  using namespace std::string_literals;
+  const std::string block = "\2\2\4kind\5UInt8\0\1\4name\6String\1a\2bc"s;
+  const std::pair<std::string, std::string> cases[] = {
+      {"", ""},
+      {block + "\2\0\4kind\5UInt8\4name\6String"s + block, "a bc a bc "},
+      {block.substr(0, block.size() - 1), "the answer is incomplete; ask again"},
+      {"\2\x80\x80\x80\x80\x80\x80\x80\x80\x80\1" + block.substr(2),
+       "the answer is incomplete; ask again"},
+      {block + "Code: 241",
+       "the answer is not of the form that was asked for; check that its tables are those that "
+       "this program made, and ask again"}};
+  for (const auto& [answer, expected] : cases) {
+    body = answer;
+    std::string names;
+    try {
+      for (const Key& key : engine->keys())
+        names += key.name + ' ';
+    } catch (const EngineError& error) {
+      names = std::string(error.what()).substr(name.size() + 2);
+    }
+    EXPECT_EQ(names, expected);
+  }
 }
 
 }  // namespace

@@ -1,45 +1,71 @@
 #include "fleet/engine/clickhouse/clickhouse_reading.h"
 
 #include <algorithm>
-#include <optional>
+#include <array>
+#include <functional>
+#include <span>
 #include <string>
+#include <type_traits>
 
-#include "fleet/engine/clickhouse/row_binary.h"
+#include "fleet/engine/clickhouse/native_block.h"
 
 namespace tavrel::fleet {
 namespace {
 
-// Far more than the texts of a row have together.
-constexpr std::size_t kLargestRow = 1U << 20;
+constexpr std::size_t kRowsAtOnce = 1024;
 
-// Rows of fixed or varying size from pieces of an answer. `parse` is false when bytes of the row
-// are still to come.
-template <class Row, class Parse>
-void readRows(Server& server, const std::string& statement, const Visitor<Row>& visit,
-              const Parse& parse) {
-  std::string rest;
-  std::vector<Row> rows;
-  server.ask(statement + " FORMAT RowBinary", [&](std::string_view piece) {
-    std::string joined;
-    if (!rest.empty()) {
-      joined = rest.append(piece);
-      rest.clear();
-      piece = joined;
+// Servers make blocks of 65,536 rows, and a row with texts takes some 200 bytes.
+constexpr std::size_t kLargestBlock = 256U << 20;
+
+// Hands the rows of a block out. A field is where in a row the value of a column belongs.
+template <class Row, class... Fields>
+void visitBlock(NativeBlock& block, const Visitor<Row>& visit, const Fields&... fields) {
+  std::array<Row, kRowsAtOnce> rows;
+  for (std::size_t left = block.rows(); left != 0;) {
+    const std::span<Row> some(rows.data(), std::min(left, rows.size()));
+    std::size_t column = 0;
+    (block.fill(column++, some, fields), ...);
+    visit(some);
+    left -= some.size();
+  }
+}
+
+template <class Row, class... Fields>
+void readRows(Server& server, std::string& bytes, const std::string& statement,
+              const Visitor<Row>& visit, const Fields&... fields) {
+  constexpr std::array kTypes = {
+      columnTypeOf<std::remove_reference_t<std::invoke_result_t<Fields, Row&>>>()...};
+  bytes.clear();
+  std::size_t enough = 1;  // bytes with which it is worth looking for a block
+  NativeBlock block;
+  const auto takeBlocks = [&] {
+    std::size_t taken = 0;
+    while (taken < bytes.size()) {
+      const NativeBlock::Found found = block.find(std::string_view(bytes).substr(taken), kTypes);
+      if (found == NativeBlock::Found::kOther) {
+        throw EngineError(server.address().name +
+                          ": the answer is not of the form that was asked for; check that its "
+                          "tables are those that this program made, and ask again");
+      }
+      if (found == NativeBlock::Found::kPart) break;
+      visitBlock<Row>(block, visit, fields...);
+      taken += block.size();
     }
-    RowReader reader(piece);
-    std::size_t left = reader.left();
-    for (Row row; parse(reader, row); left = reader.left())
-      rows.push_back(row);
-    if (!rows.empty()) visit(rows);
-    rows.clear();
-    if (left > kLargestRow) {
-      throw EngineError(server.address().name + ": a row has more than " +
-                        std::to_string(kLargestRow) +
-                        " bytes: the tables are not those of this program; check the address");
+    bytes.erase(0, taken);
+    if (bytes.size() > kLargestBlock) {
+      throw EngineError(server.address().name +
+                        ": a block of rows has more than 256 MiB: the tables are not those of this "
+                        "program; check the address");
     }
-    rest = piece.substr(piece.size() - left);
+    // As much again, so that a block is not looked through too often.
+    enough = 2 * bytes.size() + 1;
+  };
+  server.ask(statement + " FORMAT Native", [&](std::string_view piece) {
+    bytes += piece;
+    if (bytes.size() >= enough) takeBlocks();
   });
-  if (!rest.empty())
+  takeBlocks();
+  if (!bytes.empty())
     throw EngineError(server.address().name + ": the answer is incomplete; ask again");
 }
 
@@ -54,15 +80,13 @@ void ClickhouseReading::logs(std::int32_t firstDay, std::int32_t lastDay,
   const std::string days =
       "day BETWEEN " + std::to_string(firstDay) + " AND " + std::to_string(lastDay);
   readRows<LogRow>(
-      server_,
+      server_, bytes_,
       "SELECT log, day, created, os_version, previous_os_version, config_number, "
       "whitelist_digest, task_id, language, preferred_language, region FROM log WHERE " +
           days + " AND log GLOBAL IN (SELECT min(log) FROM log GROUP BY digest)",
-      visit, [](RowReader& reader, LogRow& row) {
-        return reader.getAll(row.log, row.day, row.created, row.osVersion, row.previousOsVersion,
-                             row.configNumber, row.whitelistDigest, row.taskID, row.language,
-                             row.preferredLanguage, row.region);
-      });
+      visit, &LogRow::log, &LogRow::day, &LogRow::created, &LogRow::osVersion,
+      &LogRow::previousOsVersion, &LogRow::configNumber, &LogRow::whitelistDigest, &LogRow::taskID,
+      &LogRow::language, &LogRow::preferredLanguage, &LogRow::region);
 }
 
 std::vector<Key> ClickhouseReading::keys() {
@@ -72,39 +96,38 @@ std::vector<Key> ClickhouseReading::keys() {
     std::string_view name;
   };
   readRows<KeyRow>(
-      server_, "SELECT DISTINCT kind, name FROM key ORDER BY kind, name",
+      server_, bytes_, "SELECT DISTINCT kind, name FROM key ORDER BY kind, name",
       [&](std::span<const KeyRow> rows) {
         for (const KeyRow& row : rows)
           keys.push_back({std::string(row.name), static_cast<KeyKind>(row.kind)});
       },
-      [](RowReader& reader, KeyRow& row) { return reader.getAll(row.kind, row.name); });
+      &KeyRow::kind, &KeyRow::name);
   return keys;
 }
 
 void ClickhouseReading::scalars(std::string_view key, const Visitor<ScalarValue>& visit) {
-  readRows<ScalarValue>(
-      server_, "SELECT log, value FROM scalar" + whereKey(key), visit,
-      [](RowReader& reader, ScalarValue& row) { return reader.getAll(row.log, row.value); });
+  readRows<ScalarValue>(server_, bytes_, "SELECT log, value FROM scalar" + whereKey(key), visit,
+                        &ScalarValue::log, &ScalarValue::value);
 }
 
 void ClickhouseReading::distributions(std::string_view key,
                                       const Visitor<DistributionValue>& visit) {
   readRows<DistributionValue>(
-      server_,
+      server_, bytes_,
       "SELECT log, minimum, maximum, mean, squared_deviations, count FROM distribution" +
           whereKey(key),
-      visit, [](RowReader& reader, DistributionValue& row) {
-        FiveNumbers& five = row.numbers;
-        return reader.getAll(row.log, five.minimum, five.maximum, five.mean, five.squaredDeviations,
-                             five.count);
-      });
+      visit, &DistributionValue::log,
+      [](DistributionValue & row) -> auto& { return row.numbers.minimum; },
+      [](DistributionValue & row) -> auto& { return row.numbers.maximum; },
+      [](DistributionValue & row) -> auto& { return row.numbers.mean; },
+      [](DistributionValue & row) -> auto& { return row.numbers.squaredDeviations; },
+      [](DistributionValue & row) -> auto& { return row.numbers.count; });
 }
 
 void ClickhouseReading::cells(std::string_view key, const Visitor<CellValue>& visit) {
-  readRows<CellValue>(server_, "SELECT log, lower, upper, count FROM cell" + whereKey(key), visit,
-                      [](RowReader& reader, CellValue& row) {
-                        return reader.getAll(row.log, row.lower, row.upper, row.count);
-                      });
+  readRows<CellValue>(server_, bytes_, "SELECT log, lower, upper, count FROM cell" + whereKey(key),
+                      visit, &CellValue::log, &CellValue::lower, &CellValue::upper,
+                      &CellValue::count);
 }
 
 }  // namespace tavrel::fleet

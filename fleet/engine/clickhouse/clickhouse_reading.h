@@ -1,6 +1,7 @@
 // Hands out the rows of a ClickHouse database.
 #pragma once
 
+#include <string>
 #include <string_view>
 #include <vector>
 
@@ -21,6 +22,7 @@ class ClickhouseReading {
 
  private:
   Server& server_;
+  std::string bytes_;  // of an answer; here to keep its room
 };
 
 }  // namespace tavrel::fleet

@@ -16,6 +16,9 @@ constexpr std::chrono::milliseconds kLongestPause{30'000};
 constexpr long kConnectSeconds = 10;
 constexpr std::size_t kLongestComplaint = 65'536;
 constexpr std::size_t kLongestReason = 300;
+constexpr long kReceiveBytes = 512L << 10;
+// Of an answer that the server keeps in memory until it is whole; more goes to a file there.
+constexpr const char* kAnswerBytes = "33554432";
 
 // Codes of conditions that pass: time exceeded, too many queries, network trouble between servers,
 // too many parts that wait to be merged, no replica or shard reachable.
@@ -134,6 +137,7 @@ Server::Handle Server::newHandle() const {
   set(handle, CURLOPT_CONNECTTIMEOUT, kConnectSeconds);
   set(handle, CURLOPT_TIMEOUT, static_cast<long>(address_.timeout.count()));
   set(handle, CURLOPT_POST, 1L);
+  set(handle, CURLOPT_BUFFERSIZE, kReceiveBytes);
   set(handle, CURLOPT_WRITEFUNCTION, Transfer::receive);
   return owned;
 }
@@ -141,7 +145,7 @@ Server::Handle Server::newHandle() const {
 // With this setting the server sends nothing before the statement has ended. Otherwise it would
 // append a late failure to the rows of a successful answer.
 std::string Server::urlWith(const std::string& statement) const {
-  std::string url = address_.url + "?wait_end_of_query=1";
+  std::string url = address_.url + "?wait_end_of_query=1&buffer_size=" + kAnswerBytes;
   if (!database_.empty()) url += "&database=" + database_;
   // Rows are on all servers of a cluster before the answer says so.
   if (!address_.cluster.empty()) url += "&insert_distributed_sync=1";
