@@ -9,6 +9,9 @@ namespace tavrel::fleet {
 
 namespace {
 
+// With the square of a double's 53 bits, 128 are enough. Of more bits there is only one value each.
+constexpr int kShortCountBits = 22;
+
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
 /// mantissa × 2^exponent, without the sign.
@@ -47,8 +50,13 @@ bool ExactMoments::grow(std::uint64_t count) {
 void ExactMoments::addTerm(std::uint64_t mantissa, int exponent, bool isNegative,
                            std::uint64_t count) {
   const auto bit = static_cast<std::size_t>(exponent - kLastBit);
-  sum_.add(multiply(mantissa, count), bit, isNegative);
-  squares_.add(multiply(static_cast<Uint128>(mantissa) * mantissa, count), 2 * bit, false);
+  sum_.add(static_cast<Uint128>(mantissa) * count, bit, isNegative);
+  const Uint128 square = static_cast<Uint128>(mantissa) * mantissa;
+  if (count >> kShortCountBits == 0) {
+    squares_.add(square * count, 2 * bit, false);
+  } else {
+    squares_.add(multiply(square, count), 2 * bit, false);
+  }
 }
 
 void ExactMoments::add(double mean, double squaredDeviations, std::uint64_t count) {
@@ -57,7 +65,7 @@ void ExactMoments::add(double mean, double squaredDeviations, std::uint64_t coun
   addTerm(parts.mantissa, parts.exponent, std::signbit(mean), count);
   if (squaredDeviations == 0) return;
   parts = partsOf(squaredDeviations);
-  squares_.add(multiply(parts.mantissa, 1), static_cast<std::size_t>(parts.exponent - 2 * kLastBit),
+  squares_.add(Uint128{parts.mantissa}, static_cast<std::size_t>(parts.exponent - 2 * kLastBit),
                std::signbit(squaredDeviations));
 }
 

@@ -1,5 +1,5 @@
-// Sums of 192-bit products at any place of a wide fixed-point number. Nothing is rounded, so the
-// order of the terms does not matter.
+// Sums of 128- and 192-bit products at any place of a wide fixed-point number. Nothing is rounded,
+// so the order of the terms does not matter.
 #pragma once
 
 #include <array>
@@ -29,6 +29,22 @@ class WideSum {
   using Limbs = std::array<std::uint64_t, kLimbs>;
 
   /// Adds term × 2^bit, or subtracts it.
+  void add(Uint128 term, std::size_t bit, bool isNegative) {
+    std::uint64_t* limb = sums_[isNegative ? 1 : 0].data() + bit / 64;
+    const unsigned shift = bit % 64;
+    const Uint128 low = term << shift;
+    const std::uint64_t high = shift == 0 ? 0 : highHalf(term) >> (64 - shift);
+    Uint128 carry = 0;
+    for (const std::uint64_t part : {lowHalf(low), highHalf(low), high}) {
+      carry += static_cast<Uint128>(*limb) + part;
+      *limb++ = lowHalf(carry);
+      carry >>= 64;
+    }
+    for (; carry != 0; carry >>= 64) {
+      carry += *limb;
+      *limb++ = lowHalf(carry);
+    }
+  }
   void add(const Product& term, std::size_t bit, bool isNegative) {
     std::uint64_t* limb = sums_[isNegative ? 1 : 0].data() + bit / 64;
     const unsigned shift = bit % 64;
