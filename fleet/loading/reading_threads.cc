@@ -9,8 +9,9 @@ constexpr std::size_t kPieceItems = 8;
 constexpr std::size_t kPieceBytes = 1U << 20;
 
 // What may be found and read ahead of the database: pieces, and bytes of logs, whose records take
-// about as much memory.
-constexpr std::size_t kPiecesAhead = 256;
+// about as much memory. Enough for the time in which the database takes a batch; memory that is
+// used again costs less than more of it.
+constexpr std::size_t kPiecesAhead = 80;
 constexpr std::size_t kBytesAhead = 192U << 20;
 
 }  // namespace

@@ -1,6 +1,8 @@
 #include "fleet/logs/plain_xml.h"
 
 #include <array>
+#include <bit>
+#include <cstring>
 #include <optional>
 #include <string>
 
@@ -18,6 +20,26 @@ constexpr std::array<bool, 256> kPlainCharacters = [] {
   plain['<'] = plain['>'] = plain['&'] = false;
   return plain;
 }();
+
+constexpr std::size_t kWordBytes = sizeof(std::uint64_t);
+
+// How many of eight characters, from the first on, are from 0x20 to 0x7E and stand for themselves.
+std::size_t plainInWord(const char* text) {
+  constexpr std::uint64_t kOnes = 0x0101010101010101;
+  std::uint64_t word = 0;
+  std::memcpy(&word, text, sizeof word);
+  if constexpr (std::endian::native == std::endian::big) word = __builtin_bswap64(word);
+  // Sets the top bit of the first byte that is less than a number, if there is one.
+  const auto less = [](std::uint64_t bytes, std::uint64_t number) {
+    return (bytes - number * kOnes) & ~bytes;
+  };
+  const auto equals = [&](char character) {
+    return less(word ^ static_cast<std::uint64_t>(character) * kOnes, 1);
+  };
+  const std::uint64_t others =
+      word | less(word, 0x20) | equals('<') | equals('>') | equals('&') | equals('\x7F');
+  return static_cast<std::size_t>(std::countr_zero(others & 0x80 * kOnes)) / 8;
+}
 
 class Reader {
  public:
@@ -38,9 +60,12 @@ class Reader {
   }
 
  private:
-  bool take(std::string_view text) {
-    if (!rest_.starts_with(text)) return false;
-    rest_.remove_prefix(text.size());
+  // A literal, so that its comparison is a few instructions.
+  template <std::size_t kSize>
+  bool take(const char (&text)[kSize]) {
+    constexpr std::size_t kLength = kSize - 1;
+    if (rest_.size() < kLength || std::memcmp(rest_.data(), text, kLength) != 0) return false;
+    rest_.remove_prefix(kLength);
     return true;
   }
 
@@ -100,10 +125,11 @@ class Reader {
 
   bool readEnd() {
     if (containers_.empty()) return false;
-    return take(containers_.back() ? "</dict>" : "</array>") && end();
+    return (containers_.back() ? take("</dict>") : take("</array>")) && end();
   }
 
-  bool readValue(XmlValue element, std::string_view endTag) {
+  template <std::size_t kSize>
+  bool readValue(XmlValue element, const char (&endTag)[kSize]) {
     const auto text = readText();
     return text && take(endTag) && built(buildValue(builder_, element, *text));
   }
@@ -111,8 +137,14 @@ class Reader {
   // Up to the next tag; nothing when it is not plain.
   std::optional<std::string_view> readText() {
     std::size_t size = 0;
-    while (size < rest_.size() && kPlainCharacters[static_cast<unsigned char>(rest_[size])])
+    while (true) {
+      std::size_t plain = kWordBytes;
+      while (plain == kWordBytes && rest_.size() - size >= kWordBytes)
+        size += plain = plainInWord(rest_.data() + size);
+      // A tab, a new line, or the last few characters.
+      if (size == rest_.size() || !kPlainCharacters[static_cast<unsigned char>(rest_[size])]) break;
       ++size;
+    }
     const std::string_view text = rest_.substr(0, size);
     rest_.remove_prefix(size);
     return rest_.starts_with('&') ? readReferences(text) : text;

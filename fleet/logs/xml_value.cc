@@ -11,6 +11,7 @@ namespace {
 constexpr std::string_view kSpace = " \t\n\r";
 
 std::string_view trimmed(std::string_view text) {
+  if (!text.empty() && text.front() > ' ' && text.back() > ' ') return text;
   const std::size_t first = text.find_first_not_of(kSpace);
   if (first == std::string_view::npos) return {};
   return text.substr(first, text.find_last_not_of(kSpace) - first + 1);

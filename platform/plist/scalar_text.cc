@@ -25,9 +25,15 @@ std::optional<Value> parse(std::string_view text, Options... options) {
   return value;
 }
 
-bool takePrefix(std::string_view& text, std::string_view prefix) {
-  if (!text.starts_with(prefix)) return false;
-  text.remove_prefix(prefix.size());
+bool take(std::string_view& text, char first) {
+  if (!text.starts_with(first)) return false;
+  text.remove_prefix(1);
+  return true;
+}
+
+bool takeHexadecimalMark(std::string_view& text) {
+  if (text.size() < 2 || text[0] != '0' || (text[1] != 'x' && text[1] != 'X')) return false;
+  text.remove_prefix(2);
   return true;
 }
 
@@ -48,9 +54,9 @@ void appendNumber(std::string& out, const Number& number) {
 }
 
 std::optional<Number> parseInteger(std::string_view text) {
-  const bool negative = takePrefix(text, "-");
-  if (!negative) takePrefix(text, "+");
-  const bool hexadecimal = takePrefix(text, "0x") || takePrefix(text, "0X");
+  const bool negative = take(text, '-');
+  if (!negative) take(text, '+');
+  const bool hexadecimal = takeHexadecimalMark(text);
   const auto magnitude = parse<std::uint64_t>(text, hexadecimal ? 16 : 10);
   if (!magnitude) return std::nullopt;
   constexpr auto kLargest = std::uint64_t{std::numeric_limits<std::int64_t>::max()};
@@ -63,7 +69,7 @@ std::optional<Number> parseInteger(std::string_view text) {
 }
 
 std::optional<double> parseReal(std::string_view text) {
-  if (takePrefix(text, "+") && text.starts_with('-')) return std::nullopt;
+  if (take(text, '+') && text.starts_with('-')) return std::nullopt;
   if (text.ends_with(')')) return std::nullopt;  // "nan(...)"
   return parse<double>(text);
 }

@@ -70,38 +70,43 @@ std::int64_t Names::Table::next(const Connection& connection) {
 }
 
 void Names::refresh() {
-  const auto read = [](Table& table, const auto& textOf) {
+  const auto read = [](Table& table, const auto& add) {
     table.news.bind(1, table.highest);
     while (table.news.step()) {
       table.highest = table.news.integer(0);
-      table.numbers.add(textOf(table.news), table.highest);
+      add(table.news, table.highest);
     }
     table.news.reset();
   };
-  read(keys_, [&](const Statement& row) { return joined(text_, row.integer(1), row.text(2)); });
-  read(buckets_, [&](const Statement& row) { return joined(text_, row.integer(1), row.text(2)); });
-  read(applications_, [&](const Statement& row) {
-    return joined(text_, row.text(1), row.text(2), row.text(3), row.integer(4), row.integer(5));
+  read(keys_, [&](const Statement& row, std::int64_t id) {
+    const auto kind = static_cast<std::size_t>(row.integer(1));
+    if (kind < keyNumbers_.size()) keyNumbers_[kind].add(row.text(2), id);
+  });
+  read(buckets_, [&](const Statement& row, std::int64_t id) {
+    bucketNumbers_.add(joined(text_, row.integer(1), row.text(2)), id);
+  });
+  read(applications_, [&](const Statement& row, std::int64_t id) {
+    applicationNumbers_.add(
+        joined(text_, row.text(1), row.text(2), row.text(3), row.integer(4), row.integer(5)), id);
   });
 }
 
 std::int64_t Names::key(KeyKind kind, std::string_view name) {
-  const auto number = static_cast<std::int64_t>(kind);
-  const std::string_view text = joined(text_, number, name);
-  if (const auto known = keys_.numbers.find(text)) return *known;
+  Dictionary& numbers = keyNumbers_[static_cast<std::size_t>(kind)];
+  if (const auto known = numbers.find(name)) return *known;
   const std::int64_t id = keys_.next(connection_);
   keys_.addition.bind(1, id);
-  keys_.addition.bind(2, number);
+  keys_.addition.bind(2, static_cast<std::int64_t>(kind));
   keys_.addition.bind(3, name);
   keys_.addition.run();
-  keys_.numbers.add(text, id);
+  numbers.add(name, id);
   return id;
 }
 
 std::int64_t Names::bucket(const CellRow& cell) {
   const std::int64_t key = this->key(KeyKind::kHistogram, cell.key);
   const std::string_view text = joined(text_, key, cell.label);
-  if (const auto known = buckets_.numbers.find(text)) return *known;
+  if (const auto known = bucketNumbers_.find(text)) return *known;
   const std::int64_t id = buckets_.next(connection_);
   buckets_.addition.bind(1, id);
   buckets_.addition.bind(2, key);
@@ -109,14 +114,14 @@ std::int64_t Names::bucket(const CellRow& cell) {
   buckets_.addition.bind(4, cell.upper);
   buckets_.addition.bind(5, cell.label);
   buckets_.addition.run();
-  buckets_.numbers.add(text, id);
+  bucketNumbers_.add(text, id);
   return id;
 }
 
 std::int64_t Names::application(const ApplicationRow& application) {
   const std::string_view text = joined(text_, application.bundle, application.version,
                                        application.uuid, application.orboID, application.arch);
-  if (const auto known = applications_.numbers.find(text)) return *known;
+  if (const auto known = applicationNumbers_.find(text)) return *known;
   const std::int64_t id = applications_.next(connection_);
   applications_.addition.bind(1, id);
   applications_.addition.bind(2, application.bundle);
@@ -125,7 +130,7 @@ std::int64_t Names::application(const ApplicationRow& application) {
   applications_.addition.bind(5, application.orboID);
   applications_.addition.bind(6, application.arch);
   applications_.addition.run();
-  applications_.numbers.add(text, id);
+  applicationNumbers_.add(text, id);
   return id;
 }
 

@@ -1,6 +1,7 @@
 // The numbers that keys, buckets of histograms and applications have in an SQLite file.
 #pragma once
 
+#include <array>
 #include <cstdint>
 #include <optional>
 #include <string>
@@ -59,14 +60,16 @@ class Names {
 
     Statement news;  ///< the rows above ?1: id, the texts that a name consists of
     Statement addition;
-    Dictionary numbers;
     std::int64_t highest = 0;
   };
 
   const Connection& connection_;
   Table keys_;
+  std::array<Dictionary, 3> keyNumbers_;  // by kind
   Table buckets_;
+  Dictionary bucketNumbers_;
   Table applications_;
+  Dictionary applicationNumbers_;
   std::string text_;
 };
 
