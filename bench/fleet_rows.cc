@@ -5,6 +5,8 @@
 //   tavrel_fleet_rows floor FILE LOGS [AT_ONCE]    inserts as many rows with plain SQLite
 //   tavrel_fleet_rows scan DATABASE [READERS]      reads all scalars and distributions
 //   tavrel_fleet_rows merge DATABASE TIMES         merges the logs of the first distribution
+//   tavrel_fleet_rows sum ADDRESS TIMES            lets ClickHouse add up their means
+//   tavrel_fleet_rows own ADDRESS TIMES            lets ClickHouse merge their five numbers
 //
 // Prints: what, logs or rows, seconds of the clock, seconds of the processors.
 #include <algorithm>
@@ -20,6 +22,7 @@
 #include <thread>
 #include <vector>
 
+#include "fleet/engine/clickhouse/server.h"
 #include "fleet/engine/open/open_engine.h"
 #include "fleet/questions/merged_numbers.h"
 
@@ -225,13 +228,17 @@ void scan(const char* where, std::size_t readers) {
   watch.print("scan", rows);
 }
 
+std::string firstDistribution(Engine& engine) {
+  for (const Key& key : engine.keys())
+    if (key.kind == KeyKind::kDistribution) return key.name;
+  return {};
+}
+
 // As `show` does it, after the table of logs was read. The same bits each time, or status 1.
 void merge(const char* where, std::size_t times) {
   Watch watch;
   const auto engine = openEngine(where, OpenMode::kRead);
-  std::string key;
-  for (const Key& one : engine->keys())
-    if (key.empty() && one.kind == KeyKind::kDistribution) key = one.name;
+  const std::string key = firstDistribution(*engine);
   double mean = 0;
   for (std::size_t i = 0; i < times; ++i) {
     watch.start();
@@ -246,6 +253,29 @@ void merge(const char* where, std::size_t times) {
     mean = numbers.mean;
   }
   watch.print("merge", times);
+}
+
+// The least that a client of the same kind can ask about the same rows, and as much as `merge` does
+// in the server's own arithmetic.
+constexpr const char* kSum = "sum(mean)";
+constexpr const char* kOwnMerge =
+    "min(minimum), max(maximum), sum(count) AS n, sum(mean * count) / n AS average, "
+    "sum(squared_deviations) + sum(count * mean * mean) - n * average * average";
+
+void askServer(const char* where, std::size_t times, const std::string& columns) {
+  Watch watch;
+  const std::string key = firstDistribution(*openEngine(where, OpenMode::kRead));
+  Server server(readServerAddress(where));
+  server.use(server.address().database);
+  const std::string statement =
+      "SELECT " + columns + " FROM distribution WHERE key = " + quoted(key);
+  server.ask(statement);
+  for (std::size_t i = 0; i < times; ++i) {
+    watch.start();
+    server.ask(statement);
+    watch.stop();
+  }
+  watch.print("ask", times);
 }
 
 }  // namespace
@@ -264,6 +294,8 @@ int main(int count, char** arguments) {
     scan(arguments[2], number(3, 1));
   } else if (what == "merge") {
     merge(arguments[2], number(3, 1));
+  } else if (what == "sum" || what == "own") {
+    askServer(arguments[2], number(3, 1), what == "sum" ? kSum : kOwnMerge);
   } else {
     return 2;
   }
