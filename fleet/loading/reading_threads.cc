@@ -19,12 +19,21 @@ constexpr std::size_t kBytesAhead = 192U << 20;
 ReadingThreads::ReadingThreads(std::function<void(const SourceSink&)> find,
                                const PermittedKeys& permitted, unsigned threads)
     : permitted_(permitted) {
-  threads_.emplace_back([this, find = std::move(find)] { search(find); });
-  for (unsigned i = 0; i < threads; ++i)
-    threads_.emplace_back([this] { readPieces(); });
+  try {
+    threads_.emplace_back([this, find = std::move(find)] { search(find); });
+    for (unsigned i = 0; i < threads; ++i)
+      threads_.emplace_back([this] { readPieces(); });
+  } catch (...) {
+    stop();
+    throw;
+  }
 }
 
 ReadingThreads::~ReadingThreads() {
+  stop();
+}
+
+void ReadingThreads::stop() {
   {
     const std::lock_guard lock(mutex_);
     stopped_ = true;

@@ -49,6 +49,7 @@ class ReadingThreads {
   void queue(std::shared_ptr<Piece>& piece);
   void readPieces();
   void noteFailure();
+  void stop();
 
   const PermittedKeys& permitted_;
   std::mutex mutex_;
