@@ -1,5 +1,6 @@
 // The commands that ask questions, on both engines.
 #include <algorithm>
+#include <filesystem>
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
 #include <random>
@@ -193,20 +194,56 @@ TEST_F(QuestionCommands, CompleteInBash) {
   root.write("/versions", run(file, {"completion", "versions"}).out);
   const std::string script = run(file, {"completion", "bash"}).out +
                              "tavrel-fleet() { echo \"$@\" > " + folder + "/asked; cat " + folder +
-                             "/versions; }\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrel_fleet\n"
+                             "/versions; }\n"
+                             "COMP_WORDS=($(sed 's/[:=]\\+/ & /g' <<< \"$COMP_LINE\"))\n"
+                             "[[ $COMP_LINE != *' ' ]] || COMP_WORDS+=('')\n"
+                             "COMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrel_fleet\n"
                              "echo \"${COMPREPLY[@]}\"\n";
-  const std::pair<std::string, const char*> cases[] = {
-      {"''", "load summary show compare page\n"},
-      {"compare ''", "4.9 4.10\n"},
-      {"show x --by r", "region\n"},
-      {"page --d", "--days --devices-at-least --database\n"},
-      {"--database x compare 4.9 4.1", "4.10\n"}};
-  for (const auto& [line, words] : cases) {
-    root.write("/script", "COMP_WORDS=(tavrel-fleet " + line + ")\n" + script);
+  const std::string address = "--database clickhouse://u@h:8123/d?cluster=c";
+  const struct {
+    std::string line, words, asked;
+  } cases[] = {{"", "load summary show compare page\n", ""},
+               {"compare ", "4.9 4.10\n", "completion versions\n"},
+               {"show x --by r", "region\n", ""},
+               {"show x --by=r", "region\n", ""},
+               {"page --d", "--days --devices-at-least --database\n", ""},
+               {"--database=x compare 4.9 4.1", "4.10\n", "--database x completion versions\n"},
+               {address + " ", "load summary show compare page\n", ""},
+               {address + " compare 4.9 4.1", "4.10\n", address + " completion versions\n"},
+               {"load --set-aside a:", "b\n", ""}};
+  std::filesystem::create_directory(folder + "/a:b");
+  for (const auto& [line, words, asked] : cases) {
+    root.write("/asked", "");
+    root.write("/script", "cd " + folder + "\nCOMP_LINE='tavrel-fleet " + line + "'\n" + script);
     EXPECT_EQ(std::system(("bash " + folder + "/script > " + folder + "/words").c_str()), 0);
     EXPECT_EQ(contentOf(folder + "/words"), words) << line;
+    EXPECT_EQ(contentOf(folder + "/asked"), asked) << line;
   }
-  EXPECT_EQ(contentOf(folder + "/asked"), "--database x completion versions\n");
+}
+
+TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
+  const std::string folder = root.root.path("");
+  root.write("/script.zsh", run(file, {"completion", "zsh"}).out);
+  root.write("/script.fish", run(file, {"completion", "fish"}).out);
+  root.write("/tavrel-fleet", "#!/bin/sh\necho \"$@\" > " + folder + "/asked\n");
+  std::filesystem::permissions(folder + "/tavrel-fleet", std::filesystem::perms::owner_all);
+  const std::string asks = "PATH=" + folder + ":$PATH ";
+  const std::pair<std::string, std::string> shells[] = {
+      {"fish", asks + "fish -c 'source " + folder +
+                   "/script.fish; complete -C \"tavrel-fleet --database h:1/d compare \"'"},
+      // Its functions for completion work in a terminal only.
+      {"zsh", asks +
+                  "zsh -fc '_arguments() { state=argument; words=(compare \"\"); "
+                  "[[ $* != *versions* ]] || _tavrel_fleet_list versions }\n"
+                  "_call_program() { eval \"$argv[2,-1]\" }; compadd() { }\n"
+                  "words=(tavrel-fleet --database h:1/d compare \"\"); . " +
+                  folder + "/script.zsh'"}};
+  for (const auto& [shell, command] : shells) {
+    if (std::system(("command -v " + shell + " > /dev/null").c_str()) != 0) continue;
+    root.write("/asked", "");
+    EXPECT_EQ(std::system((command + " > /dev/null").c_str()), 0) << shell;
+    EXPECT_EQ(contentOf(folder + "/asked"), "--database h:1/d completion versions\n") << shell;
+  }
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {

@@ -8,15 +8,19 @@ namespace {
 
 using Words = std::set<std::string>;
 
-/// What bash completes at the end of a command line, with the built tool in PATH.
+/// What bash completes at the end of a command line, with the built tool in PATH. As bash does, the
+/// script takes words apart at colons and equals signs.
 Words completeInBash(const TemporaryDevice& device, const std::string& line) {
   device.write("/line.bash",
                "export PATH=" TAVREL_BUILD "/bin:$PATH TAVREL_ROOT=" + device.path("") +
                    "\nsource " TAVREL_BUILD
                    "/completions/bash/tavrelctl\n"
-                   "COMP_WORDS=(tavrelctl " +
+                   "COMP_LINE='tavrelctl " +
                    line +
-                   ")\nCOMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrelctl\n"
+                   "'\n"
+                   "COMP_WORDS=($(sed 's/[:=]\\+/ & /g' <<< \"$COMP_LINE\"))\n"
+                   "[[ $COMP_LINE != *' ' ]] || COMP_WORDS+=('')\n"
+                   "COMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrelctl\n"
                    "printf '%s\\n' \"${COMPREPLY[@]}\"\n");
   const std::string command =
       "bash " + device.path("/line.bash") + " > " + device.path("/words") + " 2>&1";
@@ -58,7 +62,7 @@ void expectAll(const TemporaryDevice& device, const std::string& path, int& comm
   options.erase("--root");
   EXPECT_EQ(offered, options) << path;
   if (!help.commands.empty()) {
-    EXPECT_EQ(completeInBash(device, path + " ''"), help.commands);
+    EXPECT_EQ(completeInBash(device, path + " "), help.commands);
     for (const std::string& command : help.commands)
       expectAll(device, path.empty() ? command : path + " " + command, commands);
     return;
@@ -106,19 +110,19 @@ TEST(CompletionTest, CompletesValues) {
   device.fileLog("pending/log-tallied-20261127T180218Z-5f0c9a1e", "x", "{}");
   device.write("/folder/file.log", "");
   const std::pair<std::string, Words> kCases[] = {
-      {"stat show ''", {"com.example.a", "com.example.b"}},
+      {"stat show ", {"com.example.a", "com.example.b"}},
       {"stat show com.", {"com.example.a", "com.example.b"}},
       {"whitelist explain x y com.example.a", {"com.example.a"}},
       {"stat show com.example.a com.", {}},
-      {"plist convert --to ''", {"xml", "binary", "json"}},
+      {"plist convert --to ", {"xml", "binary", "json"}},
       {"prefs get com.", {"com.example.domain"}},
-      {"prefs get com.example.domain ''", {}},
+      {"prefs get com.example.domain ", {}},
       {"log show log", {"log-tallied-20261127T180218Z-5f0c9a1e"}},
       {"log show " + device.path("/folder/f"), {device.path("/folder/file.log")}},
       {"--root " + device.path("/fol"), {device.path("/folder")}},
-      {"--root = " + device.path("/fol"), {device.path("/folder")}},
-      {"--root = " + device.path("/folder") + " stat show com", {}},
-      {"plist convert --to =", {"xml", "binary", "json"}},
+      {"--root=" + device.path("/fol"), {device.path("/folder")}},
+      {"--root=" + device.path("/folder") + " stat show com", {}},
+      {"plist convert --to=", {"xml", "binary", "json"}},
       {"log preview --day t", {"today"}}};
   for (const auto& [line, words] : kCases)
     EXPECT_EQ(completeInBash(device, line), words) << line;

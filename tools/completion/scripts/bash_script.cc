@@ -25,19 +25,39 @@ _@id@_complete() {
   esac
 }
 
+# Sets `words` to those of the line up to the cursor. Bash takes them apart at colons and equals
+# signs, which addresses of databases have in them.
+_@id@_words() {
+  local line=$COMP_LINE word gap i
+  words=()
+  for ((i = 0; i <= COMP_CWORD; i++)); do
+    word=${COMP_WORDS[i]} gap=${line%%[![:blank:]]*}
+    line=${line#"$gap"}
+    line=${line#"$word"}
+    if ((i > 0)) && [[ -z $gap && ( $word == [:=]* || ${words[-1]} == *[:=] ) ]]; then
+      words[-1]+=$word
+    else
+      words+=("$word")
+    fi
+  done
+}
+
 _@id@() {
-  # Of --option=value, bash makes three words.
-  local cur=${COMP_WORDS[COMP_CWORD]#=} path='' given=0 wanted='' word i
-  local -a anywhere=() commands options arguments
+  local piece=${COMP_WORDS[COMP_CWORD]} cur path='' given=0 wanted='' word
+  local -a words anywhere=() commands options arguments
   local -A values
   local repeats=0
   COMPREPLY=()
   _@id@_of ''
-  for ((i = 1; i < COMP_CWORD; i++)); do
-    word=${COMP_WORDS[i]}
-    [[ $word == = ]] && continue
+  _@id@_words
+  cur=${words[-1]}
+  for word in "${words[@]:1:${#words[@]}-2}"; do
+    if [[ -z $wanted && $word == --*=* ]]; then
+      wanted=${word%%=*} word=${word#*=}
+    fi
     if [[ -n $wanted ]]; then
-      [[ $wanted == @anywhere@ ]] && anywhere=(@anywhere@ "$word")
+      # The program gets what the shell would give it.
+      [[ $wanted == @anywhere@ ]] && anywhere=(@anywhere@ "${word//[\'\"\\]/}")
       wanted=''
     elif [[ $word == @anywhere@ || ( $word == -* && -n ${values[$word]} ) ]]; then
       wanted=$word
@@ -48,10 +68,13 @@ _@id@() {
       ((given++))
     fi
   done
+  if [[ -z $wanted && $cur == --*=* ]]; then
+    wanted=${cur%%=*} cur=${cur#*=}
+  fi
   if [[ $wanted == @anywhere@ ]]; then
     _@id@_complete @kind@
   elif [[ -n $wanted ]]; then
-    _@id@_complete "${values[$wanted]}"
+    _@id@_complete "${values[$wanted]:-none}"
   elif [[ $cur == -* ]]; then
     mapfile -t COMPREPLY < <(compgen -W "${options[*]} @anywhere@ --help" -- "$cur")
   elif ((${#commands[@]})); then
@@ -61,6 +84,9 @@ _@id@() {
     ((given < ${#arguments[@]})) || { ((repeats)) && given=$((${#arguments[@]} - 1)); }
     ((given < ${#arguments[@]})) && _@id@_complete "${arguments[given]}"
   fi
+  # Bash replaces only the last piece of the word.
+  [[ $piece == *[!:=]* ]] || piece=''
+  COMPREPLY=("${COMPREPLY[@]#"${cur%"$piece"}"}")
 }
 
 complete -F _@id@ @program@

@@ -36,8 +36,19 @@ function __@id@_before
     test "$words" = "$argv[1]"
 end
 
+# What there is depends on @anywhere@.
 function __@id@_list
-    @program@ completion $argv[1] 2>/dev/null
+    set -l anywhere
+    set -l last
+    for word in (commandline -opc)
+        if test "$last" = @anywhere@
+            set anywhere @anywhere@ $word
+        else if string match -q -- '@anywhere@=*' $word
+            set anywhere $word
+        end
+        set last $word
+    end
+    @program@ $anywhere completion $argv[1] 2>/dev/null
 end
 
 )";

@@ -8,9 +8,19 @@ namespace {
 constexpr std::string_view kBegin = R"zsh(#compdef @program@
 # zsh completion for @program@. Generated: do not edit.
 
+# What there is depends on @anywhere@.
 _@id@_list() {
-  local -a found
-  found=(${(f)"$(_call_program values @program@ completion $1 2>/dev/null)"})
+  local -a found anywhere
+  local word last
+  for word in "${(@Q)_@id@_line}"; do
+    if [[ $last == @anywhere@ ]]; then
+      anywhere=(@anywhere@ $word)
+    elif [[ $word == @anywhere@=* ]]; then
+      anywhere=($word)
+    fi
+    last=$word
+  done
+  found=(${(f)"$(_call_program values @program@ "${(@q)anywhere}" completion $1 2>/dev/null)"})
   compadd -a found
 }
 
@@ -82,6 +92,8 @@ void addFunction(const CompletedProgram& program, const CommandModel& command,
   for (const CommandModel& below : command.commands)
     addFunction(program, below, script);
   script += functionName(command) + "() {\n";
+  // Of `words`, commands see what comes after their names.
+  if (command.path.empty()) script += "  local -a _@id@_line=($words)\n";
   script += "  local -a anywhere=(" +
             argumentOf(program, {}, program.anywhereOption(), program.anywhere) +
             " '--help[Show how it is used]')\n";
