@@ -1,5 +1,6 @@
 #include "fleet/engine/sqlite/pending_rows.h"
 
+#include <new>
 #include <sqlite3.h>
 
 #include "fleet/engine/sqlite/real.h"
@@ -15,13 +16,17 @@ struct Cursor : sqlite3_vtab_cursor {
   RowSource* source;
 };
 
+// SQLite calls what follows. No exception may pass through it: it would leave its connection in the
+// middle of something.
+
 RowSource& sourceOf(sqlite3_vtab_cursor* cursor) {
   return *static_cast<Cursor*>(cursor)->source;
 }
 
 int connect(sqlite3* connection, void* context, int, const char* const*, sqlite3_vtab** out,
             char**) {
-  auto* const table = new Table;
+  auto* const table = new (std::nothrow) Table;
+  if (table == nullptr) return SQLITE_NOMEM;
   static_cast<sqlite3_vtab&>(*table) = {};
   table->source = static_cast<RowSource*>(context);
   *out = table;
@@ -38,7 +43,8 @@ int plan(sqlite3_vtab*, sqlite3_index_info*) {
 }
 
 int open(sqlite3_vtab* table, sqlite3_vtab_cursor** out) {
-  auto* const cursor = new Cursor;
+  auto* const cursor = new (std::nothrow) Cursor;
+  if (cursor == nullptr) return SQLITE_NOMEM;
   static_cast<sqlite3_vtab_cursor&>(*cursor) = {};
   cursor->source = static_cast<Table*>(table)->source;
   *out = cursor;
