@@ -7,18 +7,14 @@
 namespace tavrel {
 namespace {
 
-struct Key {
-  std::uint64_t low, high;
-};
-
 std::uint64_t randomWord(std::random_device& source) {
   return std::uint64_t{source()} << 32 | source();
 }
 
-const Key& processKey() {
-  static const Key key = [] {
+const HashKey& processKey() {
+  static const HashKey key = [] {
     std::random_device source;
-    return Key{randomWord(source), randomWord(source)};
+    return HashKey{randomWord(source), randomWord(source)};
   }();
   return key;
 }
@@ -54,8 +50,7 @@ std::uint64_t wordAt(const char* at, std::size_t length) {
 
 }  // namespace
 
-std::uint64_t keyedHash(std::string_view text) {
-  const Key& key = processKey();
+std::uint64_t sipHash(std::string_view text, const HashKey& key) {
   SipState state{0x736F6D6570736575 ^ key.low, 0x646F72616E646F6D ^ key.high,
                  0x6C7967656E657261 ^ key.low, 0x7465646279746573 ^ key.high};
   std::size_t at = 0;
@@ -66,6 +61,10 @@ std::uint64_t keyedHash(std::string_view text) {
   for (int i = 0; i < 3; ++i)
     state.round();
   return state.v0 ^ state.v1 ^ state.v2 ^ state.v3;
+}
+
+std::uint64_t keyedHash(std::string_view text) {
+  return sipHash(text, processKey());
 }
 
 }  // namespace tavrel

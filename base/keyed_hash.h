@@ -7,8 +7,15 @@
 
 namespace tavrel {
 
-/// SipHash-1-3 under a key drawn once per process: the author of the texts cannot make them
-/// collide. Values differ from process to process and must not decide any order.
+struct HashKey {
+  std::uint64_t low, high;
+};
+
+/// SipHash-1-3. Values differ between orders of bytes.
+std::uint64_t sipHash(std::string_view text, const HashKey& key);
+
+/// Under a key drawn once per process: the author of the texts cannot make them collide. Values
+/// differ from process to process and must not decide any order.
 std::uint64_t keyedHash(std::string_view text);
 
 /// The same for hash tables.

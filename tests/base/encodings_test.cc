@@ -1,8 +1,10 @@
-// Base64 and ISO dates.
+// Base64, ISO dates and hashes.
+#include <bit>
 #include <gtest/gtest.h>
 
 #include "base/base64.h"
 #include "base/iso_date.h"
+#include "base/keyed_hash.h"
 
 namespace tavrel {
 namespace {
@@ -32,6 +34,18 @@ TEST(Dates, AreReadAsTheyAreWritten) {
        {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
         "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"})
     EXPECT_FALSE(parseIsoDate(text)) << text;
+}
+
+// Values of an implementation that agrees with Python's hash of bytes.
+TEST(Hash, IsSipHash) {
+  const HashKey key{0x0706050403020100, 0x0F0E0D0C0B0A0908};
+  EXPECT_EQ(sipHash("", key), 0xABAC0158050FC4DC);
+  EXPECT_EQ(sipHash("aaaaaaaa", key), 0x8FB9BDDF35C1D145);
+  if constexpr (std::endian::native == std::endian::little) {
+    EXPECT_EQ(sipHash("abcdefghijklmnopqrstuvw", key), 0x276C7C401120195C);
+  }
+  EXPECT_EQ(keyedHash("a"), keyedHash("a"));
+  EXPECT_NE(keyedHash("a"), sipHash("a", {0, 0}));
 }
 
 }  // namespace

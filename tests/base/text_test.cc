@@ -8,6 +8,7 @@
 #include <string>
 
 #include "base/civil_time.h"
+#include "base/quantity_text.h"
 #include "base/utf8.h"
 #include "base/uuid.h"
 
@@ -115,6 +116,24 @@ TEST(UuidTest, WritesAndNormalises) {
        {"", "00112233-4455-6677-8899-aabbccddeef", "00112233+4455-6677-8899-aabbccddeeff",
         "0011223g-4455-6677-8899-aabbccddeeff", "00112233-4455-6677-8899aabb-ccddeeff"})
     EXPECT_EQ(normalisedUuid(other), std::nullopt) << other;
+}
+
+TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
+  std::string quantities, sizes, ages;
+  for (const auto& [value, unit] :
+       {std::pair(41.25, "°C"), std::pair(-0.125, "°C"), std::pair(0.0, "s"),
+        std::pair(12345e-9, "s"), std::pair(0.25, "s"), std::pair(119.97, "s"),
+        std::pair(123456.0, "s"), std::pair(2.4e9, "Hz"), std::pair(1e-13, "F")})
+    quantities += quantityText(value, unit) + "; ";
+  EXPECT_EQ(quantities,
+            "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; ");
+  for (const double bytes : {0.0, 1.0, 1023.0, 1024.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
+    sizes += sizeText(bytes) + "; ";
+  EXPECT_EQ(sizes, "0 bytes; 1 byte; 1023 bytes; 1.0 KiB; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");
+  for (const int seconds : {119, 120, 7199, 7200, 172'799, 172'800})
+    ages += ageText(seconds) + "; ";
+  EXPECT_EQ(ages, "119 s; 2 min; 119 min; 2 h; 47 h; 2 days; ");
+  EXPECT_EQ(percentText(0.0908), "9.1 %");
 }
 
 }  // namespace

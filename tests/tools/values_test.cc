@@ -2,7 +2,6 @@
 #include <cmath>
 #include <limits>
 
-#include "base/quantity_text.h"
 #include "device.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
@@ -138,20 +137,6 @@ TEST(Table, MarksWhatStandsOutOnATerminalWithColours) {
             "\x1b[1mKEY\x1b[0m      \x1b[1mN\x1b[0m\n"
             "\x1b[1;31merrors\x1b[0m   \x1b[1;31m7\x1b[0m\n"
             "fine    10\n");
-}
-
-TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
-  std::string quantities, sizes;
-  for (const auto& [value, unit] :
-       {std::pair(41.25, "°C"), std::pair(-0.125, "°C"), std::pair(0.0, "s"),
-        std::pair(12345e-9, "s"), std::pair(0.25, "s"), std::pair(119.97, "s"),
-        std::pair(123456.0, "s"), std::pair(2.4e9, "Hz"), std::pair(1e-13, "F")})
-    quantities += quantityText(value, unit) + "; ";
-  EXPECT_EQ(quantities,
-            "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; ");
-  for (const double bytes : {0.0, 1.0, 1023.0, 1024.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
-    sizes += sizeText(bytes) + "; ";
-  EXPECT_EQ(sizes, "0 bytes; 1 byte; 1023 bytes; 1.0 KiB; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");
 }
 
 TEST(ValueText, ShowsTheKindOfAValue) {
