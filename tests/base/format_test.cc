@@ -80,8 +80,8 @@ TEST(Format, PrintsWhatCDoesNotHave) {
   const char* const nullText = nullptr;
   const double negativeNan = std::copysign(NAN, -1.0);
   EXPECT_EQ(format("%{public}@|%{private, mask.hash}s|%{}d", plist::Value("a"), "b", 3), "a|b|3");
-  EXPECT_EQ(format("%6@|%-6@|%2@|%.2@%.1@%.3@", plist::Value("abc"), plist::Value(12), "abc",
-                   "abc", plist::Value(12), plist::Value(12)),
+  EXPECT_EQ(format("%6@|%-6@|%2@|%.2@%.1@%.3@", plist::Value("abc"), plist::Value(12), "abc", "abc",
+                   plist::Value(12), plist::Value(12)),
             "   abc|12    |abc|ab112");
   EXPECT_EQ(format("%@ %.2@ %8@ %.2s %-8s|", null, null, plist::Dictionary(), nullText, nullText),
             "(null) (null)   (null) (null) (null)  |");

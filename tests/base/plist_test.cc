@@ -25,7 +25,7 @@ TEST(Number, ComparesByValueWhateverTheKind) {
   using Case = std::tuple<Number, Number, bool>;
   for (const auto& [a, b, equal] :
        {Case(std::int8_t{-1}, std::int64_t{-1}, true), Case(1, 1.0F, true), Case(0, -0.0, true),
-        Case(NAN, std::numeric_limits<float>::quiet_NaN(), true),
+        Case(0, std::uint64_t{0}, true), Case(NAN, std::numeric_limits<float>::quiet_NaN(), true),
         Case((std::int64_t{1} << 53) + 1, kTwoTo53, false),
         Case(std::int64_t{1} << 53, kTwoTo53, true), Case(std::uint64_t{1} << 63, kTwoTo63, true),
         Case(UINT64_MAX, 2 * kTwoTo63, false), Case(INT64_MIN, -kTwoTo63, true),

@@ -97,9 +97,10 @@ Expected<SegmentFolder::Listing> SegmentFolder::list() const {
       listing.refusals.push_back(refusal(name, reason));
     }
   };
-  const std::unique_ptr<DIR, CloseFolder> folder(
-      fdopendir(openat(folder_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC)));
+  Descriptor opened(openat(folder_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
+  const std::unique_ptr<DIR, CloseFolder> folder(opened ? fdopendir(opened.get()) : nullptr);
   if (!folder) return systemError("list", path_);
+  opened.release();
   std::minstd_rand random(std::random_device{}());
   std::map<std::uint32_t, Sample<std::string>> byOwner;
   std::size_t entries = 0;
