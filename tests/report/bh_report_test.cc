@@ -101,7 +101,7 @@ TEST_F(BHReportTest, KeepsTheLaterRowOfADistribution) {
   using Row = std::tuple<const char*, std::vector<double>, Array>;
   for (const auto& [key, values, intervals] :
        {Row("broken", {1, 2}, {10}), Row("replaced", {1, 2}, {10}), Row("replaced", {}, {10}),
-        Row("single", {7}, {})}) {
+        Row("single", {7}, {}), Row("zero", {0.0, -0.0}, {}), Row("negative", {-0.0, 0.0}, {})}) {
     fakes::FakeDistribution row(values);
     row.fails = key == std::string("broken");
     report.computeAndAddDistribution(row, key, {{"intervals", intervals}});
@@ -109,7 +109,8 @@ TEST_F(BHReportTest, KeepsTheLaterRowOfADistribution) {
   report.serializeWithDate(kDay, {});
   const Dictionary log = fake.submission.lastLog();
   EXPECT_EQ(textOf(log.get("BHDistributions")),
-            R"({"replaced": [0, 0, 0, 0, 0], "single": [7, 7, 7, 0, 1]})");
+            R"({"negative": [-0, -0, 0, 0, 2], "replaced": [0, 0, 0, 0, 0], )"
+            R"("single": [7, 7, 7, 0, 1], "zero": [0, 0, 0, 0, 2]})");
   EXPECT_TRUE(log.dictionary("BHDistributionsHistogram").empty());
 }
 
