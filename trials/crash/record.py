@@ -1,9 +1,9 @@
 #!/usr/bin/env python3
 """Runs in a guest: plays the two days on a file system and records what its block device is given.
 
-    record.py FILE-SYSTEM PROGRAMS DAY
+    record.py FILE-SYSTEM PROGRAMS DAY LOG AFTER
 
-The log of writes goes to the disk /dev/vda; as a tar file, the device after each step to /dev/vdb.
+The log of writes goes to the disk LOG; as a tar file, the device after each step to AFTER.
 """
 
 import pathlib
@@ -24,6 +24,7 @@ def mark(text):
 
 def main():
     kind, programs, day = KINDS[sys.argv[1]], sys.argv[2], int(sys.argv[3])
+    log, tar = sys.argv[4:]
     root = WORK / "device"
     root.mkdir(parents=True)
     call("cc", "-O1", "-shared", "-fPIC", "-o", str(WORK / "preload.so"),
@@ -35,7 +36,7 @@ def main():
         file.truncate(kind.size)
         loop = Loop(file)
     call("dmsetup", "create", "--noudevrules", "--noudevsync", NAME, "--table",
-         f"0 {kind.size // 512} log-writes {loop.path} /dev/vda")
+         f"0 {kind.size // 512} log-writes {loop.path} {log}")
     path = "/dev/dm-0"  # there is no udev to give it a name
     call(*kind.make, path)
     mount(path, root, kind)
@@ -56,7 +57,7 @@ def main():
     unmount(root)
     call("dmsetup", "remove", NAME)
     loop.close()
-    subprocess.run(["tar", "--create", "--file", "/dev/vdb", "--directory", WORK, "after"],
+    subprocess.run(["tar", "--create", "--file", tar, "--directory", WORK, "after"],
                    check=True)
 
 
