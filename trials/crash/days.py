@@ -64,6 +64,7 @@ class Device:
         new = path.with_name(".new")
         with open(new, "wb") as file:
             file.write(content if isinstance(content, bytes) else plistlib.dumps(content))
+            file.flush()
             os.fsync(file.fileno())
         new.rename(path)
         folder = os.open(path.parent, os.O_RDONLY)

@@ -20,9 +20,10 @@ import time
 
 from contents import tree_digest
 from days import Device, steps
+from f2fs import UnawaitedNodes
 from file_systems import KINDS, Loop, call, mount, mount_in_private, unmount
 from verdict import Undisturbed
-from write_log import FLUSH, FUA, MARK, Image, WriteLog
+from write_log import FLUSH, FUA, MARK, Image, WriteLog, torn
 
 ROUND = 500  # states that are made in one pass over the log
 State = collections.namedtuple("State", "number position cut")
@@ -41,8 +42,10 @@ class Judge:
         self.undisturbed = Undisturbed(
             options.recording / "after", work, self.steps,
             Device(work / "undisturbed", options.programs, work / "preload.so"))
+        self.unawaited = UnawaitedNodes(self.log) if self.kind.type == "f2fs" else None
         self.image = (work / "image").open("w+b")
-        self.seen = {}  # verdicts by step and content
+        self.devices = {}  # verdicts by step and what is on the device
+        self.seen = {}  # by step and content
         self.judged = collections.Counter()
         self.failures = 0
         self.find_points()
@@ -80,8 +83,34 @@ class Judge:
         return min((done[-1] if done else 0) + 1, len(self.steps)), received
 
     def judge(self, state):
-        self.image_of(state)
-        number, received = self.where(state.cut or state.position)
+        """The step, what is broken, and whether nothing is once f2fs has waited."""
+        number, received = where = self.where(state.cut or state.position)
+        pieces = () if state.cut is None else torn(
+            self.log, state.position, state.cut,
+            random.Random(f"{self.options.seed} {state.number} torn"), self.kind.atom)
+        device = *where, state.position, pieces
+        if device not in self.devices:
+            fault, lost = self.verdict(state, *where, pieces), False
+            late = self.late(state, pieces) if fault and self.kind.type == "f2fs" else None
+            if late is not None:
+                lost = not self.verdict(state, *where, (*pieces, (late, None)))
+            self.devices[device] = number, fault, lost
+        return self.devices[device]
+
+    def late(self, state, pieces):
+        """The position of a write that f2fs has lost."""
+        place = state.position - (state.cut is None)
+        while place and not self.log.entries[place].flags & (FLUSH | FUA):
+            place -= 1
+        return self.unawaited.lost(place, state.cut or state.position,
+                                   pieces[-1][0] if pieces else None)
+
+    def verdict(self, state, number, received, pieces):
+        """What is broken, or None."""
+        self.disk.advance(state.position)
+        self.disk.tear(pieces, self.kind.atom)
+        self.disk.write(self.image)
+        self.disk.mend()
         loop = Loop(self.image)
         try:
             mount(loop.path, self.device.root, self.kind)
@@ -89,12 +118,12 @@ class Judge:
                 digest = number, received, tree_digest(self.device.root)
                 self.judged["mounted"] += 1
                 if digest in self.seen:
-                    return number, self.seen[digest]
+                    return self.seen[digest]
                 fault = self.undisturbed.fault(self.device, number, received)
             finally:
                 unmount(self.device.root)
         except OSError as error:
-            return number, f"the file system: {error}"
+            return f"the file system: {error}"
         finally:
             loop.close()
         self.judged["ran"] += 1
@@ -103,17 +132,7 @@ class Judge:
         if checked.returncode and not fault:
             fault = f"{self.kind.check[0]}: {checked.stdout[-300:]}"
         self.seen[digest] = fault
-        return number, fault
-
-    def image_of(self, state):
-        image = self.disk
-        image.advance(state.position)
-        if state.cut is not None:
-            image.torn(state.cut, random.Random(f"{self.options.seed} {state.number} torn"),
-                       self.kind.atom)
-        image.write(self.image)
-        if state.cut is not None:
-            image.mend()
+        return fault
 
     def judge_all(self):
         deadline = time.monotonic() + self.options.seconds
@@ -126,11 +145,14 @@ class Judge:
             for state in sorted(chosen, key=lambda each: each.position):
                 if time.monotonic() > deadline:
                     return
-                number, fault = self.judge(state)
+                number, fault, lost = self.judge(state)
                 self.judged["states"] += 1
                 self.judged["points" if state.cut is None else "torn"] += 1
+                if lost:
+                    self.judged["lost"] += 1
+                    fault = f"{fault}: but not with the write that f2fs has not awaited"
                 if fault:
-                    self.failures += 1
+                    self.failures += not lost
                     print(f"{self.options.kind}: state {state.number}, in "
                           f"'{self.steps[number - 1].name}': {fault}: look at it with "
                           f"script/crash-test --file-system {self.options.kind} --again "
@@ -141,8 +163,10 @@ class Judge:
 
     def summary(self):
         return (f"{self.options.kind}: {self.judged['states']} states ({self.judged['points']} "
-                f"points of {len(self.points)}, {self.judged['torn']} torn), of "
-                f"{self.judged['ran']} different contents, {self.failures} broken")
+                f"points of {len(self.points)}, {self.judged['torn']} torn), "
+                f"{len(self.devices)} different ones with {self.judged['ran']} contents, "
+                f"{self.failures} broken"
+                + (f", {self.judged['lost']} by f2fs" if self.judged["lost"] else ""))
 
 
 def main():

@@ -3,9 +3,10 @@
 is stopped before and after calls that a file system must keep in order; what the chip then holds is
 what a power cut would leave. It is written to another partition, mounted and checked there.
 
-    ubifs.py PROGRAMS DAY STATES SECONDS SEED
+    ubifs.py PROGRAMS DAY STATES SECONDS SEED [FOLDER]
 
-Ends with 1 when a state breaks a promise.
+FOLDER has nand.ko and nandsim.ko, where the kernel lacks them. Ends with 1 when a state breaks a
+promise.
 """
 
 import os
@@ -25,54 +26,51 @@ from verdict import Undisturbed
 WORK = pathlib.Path("/dev/shm/crash")
 # A chip of 128 MiB with pages of 2 KiB; of it, a partition for the device and one for the states.
 CHIP = ["first_id_byte=0xec", "second_id_byte=0xa1", "third_id_byte=0x00", "fourth_id_byte=0x15"]
-BLOCKS = 120
-BLOCK, RAW_BLOCK = 1 << 17, 64 * (2048 + 64)
-ERASED = b"\xff" * RAW_BLOCK
+BLOCKS = 96
+PAGE, BLOCK, RAW_BLOCK = 2048, 1 << 17, 64 * (2048 + 64)
+PAGES = WORK / "pages"  # what nandsim keeps; of erased pages it has what was in them before
+BAD_BLOCKS = 1  # of 1024 that UBI keeps blocks for
+ERASED = b"\xff" * PAGE
 KIND = Kind("ubifs", [], "", 0, 0, [])
 VOLUME = "crash"
-SHARE = 0.6  # of the stops at which the chip is read
-SUDDEN = 0.2  # of the stops that are followed by one at a random moment
+SUDDEN = 0.5  # of the stops that are followed by one at a random moment
 LONGEST_RUN = 0.02  # seconds until that
 
 
 class Chip:
-    """Contents of a partition, spare bytes included. Blocks of equal content are kept once."""
+    """The contents of the first partition. Blocks of equal content are kept once."""
 
     def __init__(self):
-        self.blocks = {}
+        self.raw, self.names, self.blocks = [None] * BLOCKS, [None] * BLOCKS, {}
 
-    def read(self, partition):
-        raw = subprocess.run(["nanddump", "--quiet", "--noecc", "--oob", f"/dev/mtd{partition}"],
-                             check=True, capture_output=True).stdout
-        names = []
-        for start in range(0, len(raw), RAW_BLOCK):
-            block = raw[start:start + RAW_BLOCK]
-            name = hash(block) if block != ERASED else None
-            if name is not None:
-                self.blocks.setdefault(name, block)
-            names.append(name)
-        return names
+    def read(self):
+        """Reads what has changed. A block that is erased and not yet written again counts as
+        unchanged: its content is of no use any more."""
+        changed = True
+        while changed:  # the file system may just be writing what it keeps in memory for seconds
+            changed = False
+            with open(PAGES, "rb") as pages, open("/dev/mtd0", "rb", buffering=0) as device:
+                for number in range(BLOCKS):
+                    raw = pages.read(RAW_BLOCK)
+                    if raw != self.raw[number]:
+                        changed = True
+                        self.raw[number] = raw
+                        device.seek(number * BLOCK)
+                        block = device.read(BLOCK)
+                        self.names[number] = hash(block)
+                        self.blocks.setdefault(hash(block), block)
+        return tuple(self.names)
 
-    def read_at_rest(self, partition):
-        """The file system may just be writing what it keeps in memory for some seconds."""
-        names = self.read(partition)
-        while (later := self.read(partition)) != names:
-            names = later
-        return names
-
-    def write(self, partition, names):
-        call("flash_erase", "--quiet", f"/dev/mtd{partition}", "0", "0")
-        start = 0
-        while start < len(names):
-            end = start
-            while end < len(names) and names[end] is not None:
-                end += 1
-            if end > start:
-                subprocess.run(["nandwrite", "--quiet", "--noecc", "--oob", "--start",
-                                str(start * BLOCK), f"/dev/mtd{partition}", "-"], check=True,
-                               input=b"".join(self.blocks[name] for name in names[start:end]),
-                               capture_output=True)
-            start = end + 1
+    def write(self, names):
+        """To the second partition."""
+        call("flash_erase", "--quiet", "/dev/mtd1", "0", "0")
+        with open("/dev/mtd1", "r+b", buffering=0) as device:
+            for number, name in enumerate(names):
+                block = self.blocks[name]
+                for start in range(0, BLOCK, PAGE):
+                    if block[start:start + PAGE] != ERASED:
+                        device.seek(number * BLOCK + start)
+                        device.write(block[start:start + PAGE])
 
 
 class Recorder:
@@ -84,8 +82,8 @@ class Recorder:
         self.step, self.received = 0, set()
 
     def stopped(self):
-        if self.step and self.random.random() < SHARE:
-            names = self.chip.read_at_rest(0)
+        if self.step:
+            names = self.chip.read()
             if not self.states or self.states[-1][2] != names:
                 self.states.append((self.step, frozenset(self.received), names))
 
@@ -110,7 +108,7 @@ class Recorder:
 
 
 def attach(partition):
-    call("ubiattach", "-m", str(partition), "-d", str(partition))
+    call("ubiattach", "-m", str(partition), "-d", str(partition), "-b", str(BAD_BLOCKS))
 
 
 def record(device, recorder, day):
@@ -137,7 +135,7 @@ def record(device, recorder, day):
 def fault_of(state, chip, device, undisturbed, seen):
     """What is broken, and whether the content was new."""
     number, received, names = state
-    chip.write(1, names)
+    chip.write(names)
     call("dmesg", "--clear")
     attach(1)
     try:
@@ -157,14 +155,19 @@ def fault_of(state, chip, device, undisturbed, seen):
 
 
 def main():
-    programs, (day, most, seconds, seed) = sys.argv[1], map(int, sys.argv[2:])
+    programs, (day, most, seconds, seed) = sys.argv[1], map(int, sys.argv[2:6])
     deadline = time.monotonic() + seconds
     preload = WORK / "preload.so"
     for folder in ("device", "undisturbed"):
         (WORK / folder).mkdir(parents=True)
     call("cc", "-O1", "-shared", "-fPIC", "-o", str(preload),
          str(pathlib.Path(__file__).parent / "preload.c"))
-    call("modprobe", "nandsim", f"parts={BLOCKS},{BLOCKS}", *CHIP)
+    chip = [f"parts={BLOCKS},{BLOCKS}", f"cache_file={PAGES}", *CHIP]
+    if len(sys.argv) > 6:
+        call("insmod", f"{sys.argv[6]}/nand.ko")
+        call("insmod", f"{sys.argv[6]}/nandsim.ko", *chip)
+    else:
+        call("modprobe", "nandsim", *chip)
     chip = Chip()
     recorder = Recorder(chip, seed)
     device = Device(WORK / "device", programs, preload)

@@ -40,6 +40,26 @@ class WriteLog:
         return self.bytes[entry.data:entry.data + entry.length]
 
 
+def torn(log, position, cut, random, atom):
+    """Of the entries from a position to the cut any may be missing or torn, but none that were
+    written with FUA. The numbers of those that are there, each with the atoms of it that are, or
+    None when it is whole."""
+    pieces = []
+    share = random.choice([0.1, 0.5, 0.9])
+    for number in range(position, cut):
+        entry = log.entries[number]
+        atoms = range(0, entry.length, atom)
+        if not entry.length:
+            continue
+        if entry.flags & FUA:
+            pieces.append((number, None))
+        elif random.random() < share:
+            kept = atoms if random.random() < 0.7 else random.sample(
+                atoms, random.randint(1, len(atoms)))
+            pieces.append((number, tuple(sorted(kept)) if len(kept) < len(atoms) else None))
+    return tuple(pieces)
+
+
 class Image:
     """A device whose writes can be taken back."""
 
@@ -48,11 +68,10 @@ class Image:
         self.bytes = bytearray(size)
         self.used = set()  # chunks that may hold something
         self.position = 0
-        self.undo = None
+        self.undo = []
 
     def put(self, start, content):
-        if self.undo is not None:
-            self.undo.append((start, bytes(self.bytes[start:start + len(content)])))
+        self.undo.append((start, bytes(self.bytes[start:start + len(content)])))
         self.bytes[start:start + len(content)] = content
         self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
 
@@ -63,32 +82,22 @@ class Image:
             if entry.length:
                 self.put(entry.start, self.log.content(entry))
             self.position += 1
-
-    def torn(self, cut, random, atom):
-        """Of the entries up to the cut any may be missing or torn, but none that were written with
-        FUA. Undone by `mend`."""
         self.undo = []
-        share = random.choice([0.1, 0.5, 0.9])
-        for entry in self.log.entries[self.position:cut]:
-            if not entry.length:
-                continue
+
+    def tear(self, pieces, atom):
+        """Writes entries in part, as `torn` chose them. Undone by `mend`."""
+        for number, kept in pieces:
+            entry = self.log.entries[number]
             content = self.log.content(entry)
-            if entry.flags & FUA:
+            if kept is None:
                 self.put(entry.start, content)
-            elif random.random() < share:
-                pieces = range(0, entry.length, atom)
-                kept = pieces if random.random() < 0.7 else random.sample(
-                    pieces, random.randint(1, len(pieces)))
-                if len(kept) == len(pieces):
-                    self.put(entry.start, content)
-                    continue
-                for piece in kept:
-                    self.put(entry.start + piece, content[piece:piece + atom])
+            for piece in kept or ():
+                self.put(entry.start + piece, content[piece:piece + atom])
 
     def mend(self):
         for start, content in reversed(self.undo):
             self.bytes[start:start + len(content)] = content
-        self.undo = None
+        self.undo = []
 
     def write(self, file):
         file.truncate(0)

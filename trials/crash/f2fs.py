@@ -1,0 +1,50 @@
+"""The write of f2fs that a power cut can lose although its fsync has returned.
+
+An fsync waits for the blocks of nodes that it wrote and flushes the device then. Up to Linux 6.1 at
+least, fs/f2fs/node.c numbers these blocks from 0 after each checkpoint and takes the number 0 for
+"wrote none", so that the first one may reach the device after the flush.
+"""
+
+import struct
+
+from write_log import DISCARD, FLUSH, FUA, MARK
+
+BLOCK = 4096
+FOOTER = 4072  # of a node block: node, inode, flags, version of the checkpoint, next address
+FSYNC = 2  # in its flags
+
+
+def is_fsynced_node(log, entry, version):
+    if entry.length != BLOCK or entry.flags & (DISCARD | MARK):
+        return False
+    node, inode, flags, found, following = struct.unpack_from(
+        "<IIIQI", log.content(entry), FOOTER)
+    return (node > 0 and inode > 0 and flags & FSYNC and found & 0xFFFFFFFF == version
+            and following == entry.start // BLOCK + 1)
+
+
+class UnawaitedNodes:
+    def __init__(self, log):
+        self.log = log
+        self.positions = []
+        version = None
+        for position, entry in enumerate(log.entries):
+            if entry.flags & FUA and entry.length == BLOCK:  # the end of a checkpoint
+                version = struct.unpack_from("<I", log.content(entry))[0]
+            elif version is not None and is_fsynced_node(log, entry, version):
+                self.positions.append(position)
+                version = None
+
+    def lost(self, flush, end, last):
+        """The position of such a write that is missing, though its fsync had returned, when all up
+        to the flush is there and the power is cut at `end`: something is there that was written
+        later (`last` is its position), or was told to the world."""
+        entries = self.log.entries
+        for position in self.positions:
+            window = entries[flush + 1:position]
+            if position < flush or any(entry.flags & (FLUSH | FUA) for entry in window):
+                continue
+            told = any(entry.flags & MARK for entry in entries[flush:min(position, end)])
+            if told or last is not None and last > position:
+                return position
+        return None
