@@ -61,6 +61,21 @@ class Chip:
                         self.blocks.setdefault(hash(block), block)
         return tuple(self.names)
 
+    def between(self, before, after):
+        """What the chip held between two contents, where that is certain: pages of a block are
+        written in their order, and no other block changed."""
+        changed = [number for number in range(BLOCKS) if before[number] != after[number]]
+        if len(changed) != 1 or before[changed[0]] is None:
+            return
+        number = changed[0]
+        old, new = self.blocks[before[number]], self.blocks[after[number]]
+        start, end = [-(-len(block.rstrip(b"\xff")) // PAGE) * PAGE for block in (old, new)]
+        if old[:start] == new[:start]:
+            for cut in range(start + PAGE, end, PAGE):
+                block = new[:cut].ljust(BLOCK, b"\xff")
+                self.blocks.setdefault(hash(block), block)
+                yield (*before[:number], hash(block), *before[number + 1:])
+
     def write(self, names):
         """To the second partition."""
         call("flash_erase", "--quiet", "/dev/mtd1", "0", "0")
@@ -81,11 +96,18 @@ class Recorder:
         self.states = []  # the step, the logs that were received, and the chip's content
         self.step, self.received = 0, set()
 
+    def begin(self, step):
+        self.step = step
+        self.states.append((step, frozenset(self.received), self.chip.read()))
+
     def stopped(self):
         if self.step:
-            names = self.chip.read()
-            if not self.states or self.states[-1][2] != names:
-                self.states.append((self.step, frozenset(self.received), names))
+            before, after = tuple(self.chip.names), self.chip.read()
+            received = frozenset(self.received)
+            if before != after:
+                same = self.states[-1][1] == received
+                for names in (*(self.chip.between(before, after) if same else ()), after):
+                    self.states.append((self.step, received, names))
 
     def run(self, command, environment, text):
         with open(WORK / "input", "w+", encoding="utf-8") as given, \
@@ -123,7 +145,8 @@ def record(device, recorder, day):
     shutil.copytree(device.root, WORK / "after/0", symlinks=True)
     device.process = recorder.run
     for number, step in enumerate(steps(day), 1):
-        recorder.step, device.clock = number, step.clock
+        recorder.begin(number)
+        device.clock = step.clock
         step.action(device)
         shutil.copytree(device.root, WORK / f"after/{number}", symlinks=True)
         print(f"recorded: {step.name}, {len(recorder.states)} states", flush=True)

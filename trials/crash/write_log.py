@@ -73,7 +73,8 @@ class Image:
     def put(self, start, content):
         self.undo.append((start, bytes(self.bytes[start:start + len(content)])))
         self.bytes[start:start + len(content)] = content
-        self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
+        if content.strip(b"\0"):
+            self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
 
     def advance(self, position):
         """All of the entries before the position, in full."""
