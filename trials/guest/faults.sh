@@ -6,25 +6,50 @@ kept="/var/mobile /var/lib/tavrel"
 folders="$kept /run/tavrel"
 store="statistics store /var/mobile/Library/Brimhold/BHDataStore.sqlitedb"
 
-# What each unit's start came to, and its lines from warnings up.
+# Whether a unit has ended or waits for something to do.
+idle() {
+  process=$(systemctl show -P MainPID "$1")
+  # Until it is executed, the name of a program is in parentheses.
+  [ "$process" = 0 ] || awk '/^Name:/ {executed = $2 !~ /[(]/} /^State:/ {waits = $2 == "S"}
+    END {exit !(executed && waits)}' "/proc/$process/status"
+}
+
+# Lines of a unit's last start from warnings up.
+warnings() {
+  journalctl --quiet --sync
+  invocation=$(systemctl show -P InvocationID "$1")
+  journalctl --quiet -o cat -p warning "_SYSTEMD_INVOCATION_ID=$invocation" |
+    sed "s/^/  /; s|$store|STORE|; s/ [0-9]* values/ N values/"
+}
+
+# What each unit's start came to: of those that end, and of those that stay.
 outcomes() {
-  systemctl reset-failed 'tavrel-*.service'
-  for unit in collect fold daily health upload; do
+  systemctl reset-failed 'tavrel*.service'
+  for unit in collect fold daily health upload metrics; do
     systemctl restart "tavrel-$unit.service" 2>/dev/null
     while busy; do sleep 0.1; done
     echo "$unit: $(outcome "tavrel-$unit.service")"
-    journalctl --quiet --sync
-    invocation=$(systemctl show -P InvocationID "tavrel-$unit.service")
-    journalctl --quiet -o cat -p warning "_SYSTEMD_INVOCATION_ID=$invocation" |
-      sed "s/^/  /; s|$store|STORE|; s/ [0-9]* values/ N values/"
+    warnings "tavrel-$unit.service"
+  done
+  for unit in tavrel tavrel-sampler tavrel-statsd; do
+    systemctl restart "$unit.service" 2>/dev/null
+    until idle "$unit.service" 2>/dev/null; do sleep 0.1; done
+    echo "$unit: $(systemctl is-active "$unit.service") $(outcome "$unit.service")"
+    warnings "$unit.service"
+    systemctl stop "$unit.service" 2>/dev/null  # warns of sockets that can start it
   done
 }
 
+the_rest_works="metrics: success 0
+tavrel: active success 0
+tavrel-sampler: active success 0
+tavrel-statsd: active success 0"
 all_work="collect: success 0
 fold: success 0
 daily: success 0
 health: success 0
-upload: success 0"
+upload: success 0
+$the_rest_works"
 
 cover() { # OPTIONS OF TMPFS, FOLDER...
   options=$1
@@ -72,8 +97,7 @@ system; make the file system writable
   STORE: its folder cannot be made: Read-only file system: mount its file system for writing; what \
 programs recorded waits for the next fold
   STORE: its folder cannot be made: Read-only file system: mount its file system for writing; \
-N values are not kept yet: its folder cannot be opened: No such file or directory: check owner and \
-permissions of the folder
+N values are not kept yet: cannot lock /var/mobile/Library/Brimhold/.lock: No such file or directory
   the run's statistics could not be saved: the next run repeats day 24799
   cannot make the folder /var/mobile/Library: Read-only file system; make the file system writable
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: Read-only file \
@@ -85,7 +109,8 @@ upload: exit-code 238
   tavrel-upload.service: Failed to set up special execution directory in /var/lib: Read-only file \
 system
   tavrel-upload.service: Failed at step STATE_DIRECTORY spawning /usr/sbin/tavrel-upload: Read-only \
-file system" \
+file system
+$the_rest_works" \
   "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $kept
@@ -100,7 +125,8 @@ health: exit-code 1
 /var/lib/tavrel/health/memory.plist: Permission denied; run as root or as the owner of the files
   cannot keep counters: cannot write /var/lib/tavrel/health/memory.plist: Permission denied; run as \
 root or as the owner of the files
-upload: success 0" \
+upload: success 0
+$the_rest_works" \
   "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders
@@ -124,10 +150,18 @@ some space
 device; free some space
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \
 device; free some space
+  tavrelctl: STORE: database or disk is full: free some space in its file system
 health: exit-code 1
   cannot keep counters: cannot write /var/lib/tavrel/health/memory.plist: No space left on device; \
 free some space
-upload: success 0" \
+upload: success 0
+metrics: exit-code 1
+  tavrelctl: cannot write /run/tavrel/metrics/tavrel.prom: No space left on device; free some space
+tavrel: active success 0
+tavrel-sampler: activating exit-code 1
+  tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
+'tavrelctl stat fold'
+tavrel-statsd: active success 0" \
   "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders

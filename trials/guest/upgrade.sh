@@ -10,6 +10,8 @@ rm "$submission"/pending/*
 expect "other users are refused" 1 "$(setpriv --reuid recorder --clear-groups \
   tavrelctl send force yesterday >/dev/null 2>&1; echo $?)"
 
+# An owner who does without readings of drives.
+systemctl disable --quiet --now tavrel-health.timer
 exported() { tavrelctl stat export | grep -F com.example. | sort; }
 before=$(exported)
 if [ "$extent" = whole ]; then
@@ -28,6 +30,11 @@ expect "their version" "$later_version" "$(dpkg-query -W -f '${Version}\n' tavre
   tavrel-upload libbrimhold1 python3-brimhold | sort -u)"
 expect "all is configured" "" "$(dpkg --audit)"
 expect "an upgrade keeps the statistics" "$before" "$(exported)"
+expect "what was switched off stays off" disabled,inactive "$({
+  systemctl is-enabled tavrel-health.timer
+  systemctl is-active tavrel-health.timer
+} | paste -sd ,)"
+systemctl enable --quiet --now tavrel-health.timer
 expect "the timers run on" 5 "$(systemctl list-units --no-legend --plain --state=active \
   'tavrel-*.timer' | wc -l)"
 expect "so does the sampler" active "$(systemctl is-active tavrel-sampler.service)"
