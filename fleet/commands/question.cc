@@ -37,9 +37,10 @@ void addQuestionOptions(Command command, QuestionOptions& options) {
       .typeName("K");
 }
 
-void addFormOptions(Command command, FleetContext& context, QuestionOptions& options) {
-  context.addJsonOption(command);
-  command.addFlag("--csv", options.csv, "Print comma-separated values").excludes("--json");
+Option addFormOptions(Command command, FleetContext& context, QuestionOptions& options) {
+  const Option json = context.addJsonOption(command);
+  command.addFlag("--csv", options.csv, "Print comma-separated values").excludes(json);
+  return json;
 }
 
 Question::Question(FleetContext& context, const QuestionOptions& options)

@@ -23,8 +23,8 @@ struct QuestionOptions {
 
 /// Adds --days and --devices-at-least.
 void addQuestionOptions(Command command, QuestionOptions& options);
-/// Adds --json and --csv, of which at most one may be given.
-void addFormOptions(Command command, FleetContext& context, QuestionOptions& options);
+/// Adds --json and --csv, of which at most one may be given. Returns --json.
+Option addFormOptions(Command command, FleetContext& context, QuestionOptions& options);
 
 /// An argument that only the database can judge is wrong: the text for `failUsage`.
 class UsageError : public std::runtime_error {

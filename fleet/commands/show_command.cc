@@ -75,11 +75,11 @@ void addShowCommand(Command top, FleetContext& context) {
                  "Show other days, or the logs of one OS version, beside the rest")
       .typeName("DAYS|VERSION");
   addQuestionOptions(command, *options);
-  addFormOptions(command, context, *options);
+  const Option json = addFormOptions(command, context, *options);
   command
       .addFlag("--buckets", options->buckets,
                "Print the histograms of all parts instead of their figures")
-      .excludes("--json");
+      .excludes(json);
   command.onRun([&context, options] {
     ask(context, *options, [&](Question& question) {
       const std::vector<ShowAnswer> shown = answers(question, *options);

@@ -189,8 +189,7 @@ void addLogCommands(Command app, ToolContext& context) {
       .showDefault();
   const Option raw =
       showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes as they are");
-  context.addJsonOption(showCommand);
-  raw.excludes("--json");
+  raw.excludes(context.addJsonOption(showCommand));
   showCommand.onRun([&context, arguments] { show(context, *arguments); });
 }
 

@@ -38,11 +38,6 @@ Option Option::excludes(const Option& other) const {
   return *this;
 }
 
-Option Option::excludes(const char* otherName) const {
-  option_->excludes(otherName);
-  return *this;
-}
-
 Command Command::addCommand(const char* name, const char* description) const {
   return Command(*app_->add_subcommand(name, description));
 }

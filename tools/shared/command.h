@@ -36,7 +36,6 @@ class Option {
   /// `fault` says what is wrong with the text of a value; empty when nothing is.
   Option check(std::function<std::string(const std::string& text)> fault) const;
   Option excludes(const Option& other) const;
-  Option excludes(const char* otherName) const;
 
  private:
   CLI::Option* option_;

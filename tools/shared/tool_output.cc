@@ -61,8 +61,8 @@ ToolStreams standardStreams() {
           .outIsColoured = isColoured()};
 }
 
-void ToolOutput::addJsonOption(Command command) {
-  command.addFlag("--json", json_, "Print JSON (format_version 1)");
+Option ToolOutput::addJsonOption(Command command) {
+  return command.addFlag("--json", json_, "Print JSON (format_version 1)");
 }
 
 void ToolOutput::printJson(Json object) {

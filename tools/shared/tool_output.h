@@ -72,7 +72,7 @@ class ToolOutput {
   // -- JSON --------------------------------------------------------------------------------------
 
   /// Adds `--json` to a subcommand that prints data.
-  void addJsonOption(Command command);
+  Option addJsonOption(Command command);
   bool json() const { return json_; }
   /// Prints `object` as an indented document that begins with the member "format_version".
   void printJson(Json object);
