@@ -107,7 +107,7 @@ void readMemoryErrors(fuzz::Tree& tree, fuzz::Input& input) {
   require(ends >= 2);
 }
 
-// Whatever the name is, the number behind it is the one that the kernel wrote.
+// Whatever the name is, the number after it is the one that the kernel wrote.
 void readProcess(fuzz::Input& input) {
   const std::string whole(input.text());
   startInStat(whole);

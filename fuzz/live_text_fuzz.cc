@@ -2,7 +2,7 @@
 // of files that holds nothing of earlier inputs. Each channel of a legend is known, and the values
 // of all fit into the room that was named for them; so they do once a file is empty.
 //
-// Input: the number of a file and its content, with 0xFF behind it, again and again.
+// Input: the number of a file and its content, followed by 0xFF; repeated.
 #include <array>
 #include <optional>
 #include <utility>

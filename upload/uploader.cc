@@ -63,7 +63,7 @@ void noteFailure(const Services& services, std::string_view why) {
 }
 
 Uploader::Permission Uploader::permission() {
-  // Read anew: whoever withdraws it is another process.
+  // Read again: whoever withdraws it is another process.
   services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
   bool isThere = false;
   services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain,

@@ -58,7 +58,7 @@ class Uploader {
   enum class Permission { Given, Withdrawn, NotGiven };
   enum class Step { Next, Held, Stop, Broken, Withdrawn, Misconfigured };
 
-  /// Reads `permitted_` anew. `NotGiven` also when its first day is none.
+  /// Reads `permitted_` again. `NotGiven` also when its first day is not a day.
   Permission permission();
   Outcome runLocked(bool atOnce);
   Outcome sendAll(std::vector<WaitingLog> logs);
