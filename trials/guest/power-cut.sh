@@ -17,3 +17,5 @@ date --utc --set '2037-11-25 01:10' >/dev/null
 wait
 touch /run/job/pull
 sleep 60
+echo "DIFFERS  nobody pulled the plug within a minute"
+exit 1
