@@ -1,5 +1,8 @@
 // Segments that no honest program would leave.
 
+#include <random>
+#include <thread>
+
 #include "recording.h"
 
 namespace tavrel {
@@ -116,6 +119,25 @@ TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
     }
     restore();
   }
+}
+
+TEST_F(HostileSegment, MayChangeWhileItIsRead) {
+  std::atomic<bool> isDone = false;
+  std::thread writer([&] {
+    std::mt19937 random(1);
+    while (!isDone) {
+      const std::uint64_t word = std::uint64_t{random()} << 32 | random();
+      const std::uint64_t place = random() % (random() % 2 == 0 ? 4096 : original_.size()) & ~7U;
+      if (place < kBHNames || place >= kBHNames + 64) write(place, word >> random() % 64);
+      if (random() % 64 == 0) restore();
+    }
+  });
+  for (int i = 0; i < 2'000; ++i)
+    readAll(i % 2 == 0);
+  isDone = true;
+  writer.join();
+  restore();
+  EXPECT_EQ(readAll(), "1 300 0");
 }
 
 }  // namespace

@@ -8,6 +8,7 @@
 #include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/device/ecc_events.h"
+#include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
@@ -19,6 +20,7 @@ namespace {
 constexpr uid_t kNobody = 65534;
 const std::string kSubmission = "/var/mobile/Library/Logs/Submission";
 const std::string kStoreFolder = "/var/mobile/Library/Brimhold";
+const std::string kSegments = "/run/tavrel/stat";
 const std::string kEvents = "/var/lib/tavrel/ecc-events";
 
 struct LockTest : testing::Test, DeviceServices {};
@@ -62,10 +64,10 @@ TEST_F(LockTest, AnotherUserHindersNoProgram) {
         *coding.encodeXml(plist::Dictionary{{"EccEvents", plist::Dictionary{{"Bytes", 65536}}}}));
   for (int i = 10; i < 28; ++i)
     write(kEvents + "/" + std::to_string(i) + ".event", std::string(kEccEventBytes, 'e'));
-  for (const std::string& folder : {std::string("/run/tavrel"), kSubmission, kStoreFolder})
+  for (const std::string& folder : {kSegments, kSubmission, kStoreFolder})
     fs::create_directories(root.path(folder));
-  const Hinderer hinderer({root.path("/"), root.path("/run/tavrel"), root.path(kSubmission),
-                           root.path(kStoreFolder), events});
+  const Hinderer hinderer({root.path("/"), root.path("/run/tavrel"), root.path(kSegments),
+                           root.path(kSubmission), root.path(kStoreFolder), events});
 
   LinuxPlatform device(root, {.log = &log});
   Platform& platform = device.platform();
@@ -74,6 +76,9 @@ TEST_F(LockTest, AnotherUserHindersNoProgram) {
   device.preferences().ZTXPreferencesSynchronize("com.norvane.zentrix");
   platform.statistics->BHClientSetValueForScalarKey("k", 1);
   EXPECT_TRUE(device.store().commit());
+  const FoldReport fold = device.fold().run();
+  EXPECT_TRUE(fold.hasFolder);
+  EXPECT_EQ(fold.failure, std::nullopt);
   platform.statistics->initWithDefaultPath()->scalarsForKeyPrefix("", 20782, 20783,
                                                                   [](auto, auto, auto, auto&) {});
   EXPECT_TRUE(platform.submission->ZTXWriteLogForSubmission(
