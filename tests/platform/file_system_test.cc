@@ -87,7 +87,7 @@ TEST_F(FileSystemTest, AppendsWholeLines) {
   auto file = files.openToAppend(path, 0640);
   ASSERT_TRUE(file && file->append(asBytes("three\n"), 100) && file->append(asBytes("4\n"), 100));
   EXPECT_EQ(messageOf(file->append(asBytes("five\n"), 16)),
-            "cannot append to " + path + ": it may have 16 bytes");
+            "cannot append to " + path + ": it would exceed its limit of 16 bytes; move it away");
   ASSERT_TRUE(file->append(asBytes("5\n"), 14));
   file = Error{"released"};
 

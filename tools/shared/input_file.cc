@@ -30,7 +30,7 @@ Expected<std::string> readStream(std::istream& in, std::string_view name, std::s
     bytes.resize(before + static_cast<std::size_t>(in.gcount()));
     if (bytes.size() > largest) return tooLarge(name, largest);
   }
-  if (in.bad()) return Error{format("%s: cannot be read", name)};
+  if (in.bad()) return systemError("read", name);
   return bytes;
 }
 

@@ -1,7 +1,5 @@
 #include "tools/stat/stat_transfer.h"
 
-#include <cerrno>
-#include <cstring>
 #include <fstream>
 #include <istream>
 #include <nlohmann/json.hpp>
@@ -10,6 +8,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "platform/linux/files/system_error.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
@@ -38,7 +37,7 @@ Status feedAll(std::istream& in, const std::string& name, std::int32_t today,
     in.read(block.data(), static_cast<std::streamsize>(block.size()));
     fed = parser.feed({block.data(), static_cast<std::size_t>(in.gcount())}, sink);
   }
-  if (in.bad()) return Error{format("cannot read %s: %s", name, std::strerror(errno))};
+  if (in.bad()) return systemError("read", name);
   if (fed) fed = parser.finish(sink);
   if (!fed) return Error{format("%s:%llu: %s", name, parser.lines(), fed.error().message)};
   return fed;
@@ -78,7 +77,7 @@ void importStream(ToolContext& context, std::istream& in, const std::string& nam
 void importStatistics(ToolContext& context, const std::string& file) {
   if (file == "-") return importStream(context, context.in(), "standard input");
   std::ifstream stream(file, std::ios::binary);
-  if (!stream) return context.fail(format("cannot open %s: %s", file, std::strerror(errno)));
+  if (!stream) return context.fail(systemError("open", file).message);
   importStream(context, stream, file);
 }
 

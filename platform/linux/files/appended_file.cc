@@ -55,8 +55,8 @@ Status AppendedFile::mend() {
 
 Status AppendedFile::append(ByteSpan bytes, std::size_t largest) {
   if (bytes.size() > largest || size_ > largest - bytes.size()) {
-    return Error{"cannot append to " + path_ + ": it may have " + std::to_string(largest) +
-                 " bytes"};
+    return Error{"cannot append to " + path_ + ": it would exceed its limit of " +
+                 std::to_string(largest) + " bytes; move it away"};
   }
   if (Status mended = mend(); !mended) return mended;
   isFlushed_ = false;
