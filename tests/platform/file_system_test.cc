@@ -2,6 +2,7 @@
 
 #include "device_services.h"
 #include "faulty_file_system.h"
+#include "platform/linux/files/property_list_file.h"
 
 namespace tavrel {
 namespace {
@@ -69,6 +70,16 @@ TEST_F(FileSystemTest, RemovesTemporaryFilesOnceTheyAreOld) {
   ASSERT_TRUE(files.replace(root.path("/d/file"), asBytes("x"), 0644));
   for (const auto& [name, age, stays] : kFiles)
     EXPECT_EQ(fs::exists(root.path(name)), stays) << name;
+}
+
+TEST_F(FileSystemTest, SaysWhySettingsAreNotTrusted) {
+  write("/settings", "");
+  EXPECT_EQ(reasonToDistrust(root.path("/settings")), "");
+  fs::permissions(root.path("/settings"), fs::perms(0660));
+  EXPECT_EQ(reasonToDistrust(root.path("/settings")),
+            "users other than root may write it: make root its owner and set mode 0644");
+  EXPECT_EQ(reasonToDistrust(root.path("/missing")),
+            "its owner is unknown: No such file or directory");
 }
 
 TEST_F(FileSystemTest, AppendsWholeLines) {

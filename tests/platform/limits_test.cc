@@ -106,9 +106,10 @@ TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
        {std::pair(geteuid(), 0620), {geteuid(), 0602}, {65534U, 0600}}) {
     if (chown(path.c_str(), owner, getegid()) != 0) continue;  // not root
     ASSERT_EQ(chmod(path.c_str(), static_cast<mode_t>(mode)), 0);
-    EXPECT_EQ(tidy().failures,
-              Lines{path + ": others than root may write it; make root its owner, with mode 0644: "
-                           "nothing is removed until it is repaired"});
+    EXPECT_EQ(
+        tidy().failures,
+        Lines{path + ": users other than root may write it: make root its owner and set mode 0644: "
+                     "nothing is removed until it is repaired"});
   }
   EXPECT_EQ(daysHeld().size(), 201U);
 }

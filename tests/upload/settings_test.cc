@@ -129,9 +129,9 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
   const std::string good = url + "https://[::1]:8443/a/</string>";
   device.configure(good);
   fs::permissions(at, fs::perms(0646));
-  EXPECT_EQ(
-      configured(good).error().message,
-      "cannot use " + at + ": others than root may write it; make root its owner, with mode 0644");
+  EXPECT_EQ(configured(good).error().message,
+            "cannot use " + at +
+                ": users other than root may write it: make root its owner and set mode 0644");
   fs::permissions(at, fs::perms(0644));
   EXPECT_EQ(configured(good)->host, "::1");
   EXPECT_EQ(configured(good)->url, "https://[::1]:8443/a");

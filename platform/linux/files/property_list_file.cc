@@ -1,5 +1,7 @@
 #include "platform/linux/files/property_list_file.h"
 
+#include <cerrno>
+#include <system_error>
 #include <unistd.h>
 
 #include "base/limits.h"
@@ -21,13 +23,14 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
   return {};
 }
 
-std::string_view reasonToDistrust(const std::string& path) {
+std::string reasonToDistrust(const std::string& path) {
   const auto status = FileSystem::status(path);
-  if (status && (status->st_uid == 0 || status->st_uid == geteuid()) &&
+  if (!status) return "its owner is unknown: " + std::generic_category().message(errno);
+  if ((status->st_uid == 0 || status->st_uid == geteuid()) &&
       (status->st_mode & (S_IWGRP | S_IWOTH)) == 0) {
     return {};
   }
-  return "others than root may write it; make root its owner, with mode 0644";
+  return "users other than root may write it: make root its owner and set mode 0644";
 }
 
 }  // namespace tavrel

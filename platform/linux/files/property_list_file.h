@@ -2,7 +2,6 @@
 #pragma once
 
 #include <string>
-#include <string_view>
 
 #include "base/plist.h"
 #include "platform/linux/files/file_system.h"
@@ -16,8 +15,8 @@ namespace tavrel {
 plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& propertyLists,
                                      SystemLog& log, const std::string& path);
 
-/// Why settings that decide about others' data are not to be trusted. Empty when nobody but root
-/// and this process's user may write the file.
-std::string_view reasonToDistrust(const std::string& path);
+/// Why settings that decide about others' data are not to be trusted: users other than root and
+/// this process's may write the file, or its owner is unknown. Empty when they can be trusted.
+std::string reasonToDistrust(const std::string& path);
 
 }  // namespace tavrel
