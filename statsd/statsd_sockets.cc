@@ -45,13 +45,31 @@ bool isDatagramSocket(int descriptor) {
   return getsockopt(descriptor, SOL_SOCKET, SO_TYPE, &type, &size) == 0 && type == SOCK_DGRAM;
 }
 
+// 0, or an `errno`.
 template <class Address>
-bool bindTo(int descriptor, const Address& address) {
-  return bind(descriptor, reinterpret_cast<const sockaddr*>(&address), sizeof address) == 0;
+int bindTo(const DatagramSocket& made, const Address& address) {
+  const auto* const any = reinterpret_cast<const sockaddr*>(&address);
+  return bind(made.descriptor(), any, sizeof address) == 0 ? 0 : errno;
 }
 
-DatagramSocket newSocket(int family) {
+std::string_view adviceFor(int code) {
+  switch (code) {
+    case EADDRINUSE:
+      return "; end or remove what uses it, or give another";
+    case EMFILE:
+      return "; raise the number of files that a process may open (ulimit -n)";
+    default:
+      return "";
+  }
+}
+
+Error failure(std::string_view what, int code = errno) {
+  return Error{format("%s: %s%s", what, std::strerror(code), adviceFor(code))};
+}
+
+Expected<DatagramSocket> newSocket(int family) {
   DatagramSocket made(socket(family, SOCK_DGRAM | SOCK_CLOEXEC, 0));
+  if (made.descriptor() < 0) return failure("cannot make a socket");
   setsockopt(made.descriptor(), SOL_SOCKET, SO_RCVBUF, &kReceiveBuffer, sizeof kReceiveBuffer);
   return made;
 }
@@ -60,10 +78,9 @@ DatagramSocket newSocket(int family) {
 bool isAbandoned(const sockaddr_un& address) {
   struct stat status {};
   if (lstat(address.sun_path, &status) != 0 || !S_ISSOCK(status.st_mode)) return false;
-  const DatagramSocket probe = newSocket(AF_UNIX);
-  return connect(probe.descriptor(), reinterpret_cast<const sockaddr*>(&address), sizeof address) !=
-             0 &&
-         errno == ECONNREFUSED;
+  const auto probe = newSocket(AF_UNIX);
+  const auto* const any = reinterpret_cast<const sockaddr*>(&address);
+  return probe && connect(probe->descriptor(), any, sizeof address) != 0 && errno == ECONNREFUSED;
 }
 
 // Room for a batch, where the kernel writes.
@@ -103,10 +120,6 @@ class Batch {
   std::array<mmsghdr, kBatch> messages_;
 };
 
-Error failure(const char* what) {
-  return Error{format("%s: %s", what, std::strerror(errno))};
-}
-
 }  // namespace
 
 DatagramSocket::~DatagramSocket() {
@@ -135,13 +148,14 @@ Expected<std::vector<DatagramSocket>> activatedDatagramSockets() {
 }
 
 Expected<DatagramSocket> openLoopbackSocket(std::uint16_t port) {
-  DatagramSocket made = newSocket(AF_INET);
+  auto made = newSocket(AF_INET);
+  if (!made) return made;
   sockaddr_in address{};
   address.sin_family = AF_INET;
   address.sin_port = htons(port);
   address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
-  if (!bindTo(made.descriptor(), address)) {
-    return failure(format("cannot listen on UDP port %u", unsigned{port}).c_str());
+  if (const int code = bindTo(*made, address); code != 0) {
+    return failure(format("cannot listen on UDP port %u", unsigned{port}), code);
   }
   return made;
 }
@@ -154,13 +168,14 @@ Expected<DatagramSocket> openUnixSocket(const std::string& path) {
                         sizeof address.sun_path - 1)};
   }
   path.copy(address.sun_path, path.size());
-  DatagramSocket made = newSocket(AF_UNIX);
-  bool isBound = bindTo(made.descriptor(), address);
-  if (!isBound && errno == EADDRINUSE && isAbandoned(address)) {
+  auto made = newSocket(AF_UNIX);
+  if (!made) return made;
+  int code = bindTo(*made, address);
+  if (code == EADDRINUSE && isAbandoned(address)) {
     unlink(address.sun_path);
-    isBound = bindTo(made.descriptor(), address);
+    code = bindTo(*made, address);
   }
-  if (!isBound) return failure(format("cannot listen on %s", path).c_str());
+  if (code != 0) return failure(format("cannot listen on %s", path), code);
   chmod(address.sun_path, 0666);
   return made;
 }

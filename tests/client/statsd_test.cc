@@ -1,4 +1,5 @@
 #include <netinet/in.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 #include <sys/un.h>
 
@@ -27,6 +28,8 @@ void send(int family, const Address& address, const std::vector<std::string>& da
               std::ssize(datagram));
   }
 }
+
+const std::string kInUse = ": Address already in use; end or remove what uses it, or give another";
 
 class Statsd : public Recording {
  protected:
@@ -95,6 +98,9 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   sockaddr_in address{};
   socklen_t size = sizeof address;
   getsockname(loopback->descriptor(), reinterpret_cast<sockaddr*>(&address), &size);
+  const std::uint16_t port = ntohs(address.sin_port);
+  EXPECT_EQ(openLoopbackSocket(port).error().message,
+            "cannot listen on UDP port " + std::to_string(port) + kInUse);
   // They wait for the program, which starts because of them.
   const std::string longest = std::string(kLongestDatagram - 7, '\n') + "long:1|c";
   send(AF_UNIX, unixAddress(path), {"u:1|c", longest.substr(1), longest, std::string()});
@@ -137,7 +143,7 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
     fold();
   EXPECT_EQ(scalars.begin()->first.first, "own");
 
-  const std::string taken = "cannot listen on " + path + ": Address already in use\n";
+  const std::string taken = "cannot listen on " + path + kInUse + "\n";
   const std::tuple<std::string, int, std::string> cases[] = {
       {"--unix " + path, 1, taken},
       {"--unix /x/" + std::string(106, 'x'), 1,
@@ -158,6 +164,18 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
       "in the socket unit\n");
   kill(child, SIGTERM);
   EXPECT_EQ(waitFor(child), SIGTERM);
+}
+
+TEST(StatsdSockets, SayWhenNoDescriptorIsLeft) {
+  rlimit before{};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+  const auto made = openLoopbackSocket(0);
+  setrlimit(RLIMIT_NOFILE, &before);
+  EXPECT_EQ(made.error().message,
+            "cannot make a socket: Too many open files; raise the number of files that a process "
+            "may open (ulimit -n)");
 }
 
 }  // namespace
