@@ -20,6 +20,7 @@ std::uint64_t keyedHash(std::string_view text);
 
 /// The same for hash tables.
 struct KeyedHash {
+  using is_transparent = void;
   std::size_t operator()(std::string_view text) const {
     return static_cast<std::size_t>(keyedHash(text));
   }

@@ -5,6 +5,8 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "base/keyed_hash.h"
+
 namespace tavrel::fleet {
 
 namespace {
@@ -23,11 +25,8 @@ class Interner {
   }
 
  private:
-  struct Hash : std::hash<std::string_view> {
-    using is_transparent = void;
-  };
   std::vector<std::string>& texts_;
-  std::unordered_map<std::string, std::uint32_t, Hash, std::equal_to<>> numbers_;
+  std::unordered_map<std::string, std::uint32_t, KeyedHash, std::equal_to<>> numbers_;
 };
 
 }  // namespace

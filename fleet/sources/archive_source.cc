@@ -12,6 +12,7 @@
 #include <utility>
 
 #include "base/format.h"
+#include "base/keyed_hash.h"
 #include "fleet/logs/limits.h"
 #include "fleet/sources/file_name.h"
 #include "fleet/sources/limits.h"
@@ -102,7 +103,7 @@ bool isFile(archive_entry* entry) {
   return archive_entry_filetype(entry) == AE_IFREG && archive_entry_hardlink(entry) == nullptr;
 }
 
-using Sidecars = std::unordered_map<std::string, Expected<LogMetadata>>;
+using Sidecars = std::unordered_map<std::string, Expected<LogMetadata>, KeyedHash>;
 
 Sidecars readSidecars(const std::string& path) {
   Sidecars sidecars;

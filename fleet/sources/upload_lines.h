@@ -8,6 +8,7 @@
 #include <unordered_map>
 
 #include "base/expected.h"
+#include "base/keyed_hash.h"
 #include "fleet/logs/log_metadata.h"
 
 namespace tavrel::fleet {
@@ -24,7 +25,7 @@ class UploadLines {
  private:
   bool add(std::string_view line);
 
-  std::unordered_map<std::string, LogMetadata> logs_;  // by "DEVICE/LOG"
+  std::unordered_map<std::string, LogMetadata, KeyedHash> logs_;  // by "DEVICE/LOG"
 };
 
 }  // namespace tavrel::fleet

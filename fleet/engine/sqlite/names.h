@@ -9,6 +9,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "base/keyed_hash.h"
 #include "fleet/engine/engine.h"
 #include "fleet/engine/sqlite/connection.h"
 #include "fleet/model/log_record.h"
@@ -31,7 +32,7 @@ class Dictionary {
   };
 
   std::vector<Entry> entries_;
-  std::unordered_map<std::string_view, std::size_t> places_;
+  std::unordered_map<std::string_view, std::size_t, KeyedHash> places_;
   TextArena texts_;
   std::size_t last_ = 0;
 };

@@ -85,12 +85,8 @@ class InterruptReader final : public TextReader {
   }
 
  private:
-  struct Hash : KeyedHash {
-    using is_transparent = void;
-  };
-
   std::uint32_t processors_;
-  std::unordered_map<std::string, std::uint32_t, Hash, std::equal_to<>> rows_;
+  std::unordered_map<std::string, std::uint32_t, KeyedHash, std::equal_to<>> rows_;
 };
 
 void addCounts(const std::string& path, const std::string& prefix, std::string_view group,

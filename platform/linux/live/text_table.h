@@ -46,13 +46,9 @@ class TableReader final : public TextReader {
   void read(std::string_view text, std::span<std::int64_t> slots) const override;
 
  private:
-  struct Hash : KeyedHash {
-    using is_transparent = void;
-  };
-
   TableForm form_;
   std::vector<Cell> cells_;  // of every row, by ascending tokens
-  std::unordered_map<std::string, std::uint32_t, Hash, std::equal_to<>> rows_;
+  std::unordered_map<std::string, std::uint32_t, KeyedHash, std::equal_to<>> rows_;
 };
 
 /// How a figure gets into the daily log: not at all, as it is, or added to a fold of that name.
