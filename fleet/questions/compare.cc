@@ -52,7 +52,7 @@ struct Sample {
       withoutMean->insert(log);
     }
   }
-  LogSet withMean() const { return withoutMean ? logs.differenceWith(*withoutMean) : logs; }
+  LogSet withMean() const { return withoutMean ? logs.without(*withoutMean) : logs; }
 
   const LogTable& table;
   LogSet logs;

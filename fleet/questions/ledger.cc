@@ -11,7 +11,7 @@ bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   if (found == shown_.end()) return true;
   const auto& sets = found->second;
   const bool differsEnough = std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
-    return logs == *other || hasEnough(logs.differenceWith(*other));
+    return logs == *other || logs.differsByAtLeast(*other, devicesAtLeast_, table_);
   });
   return differsEnough && leavesEnough(logs, sets, logs) &&
          std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
@@ -28,7 +28,7 @@ bool Ledger::leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& 
     take(*part);
   take(added);
   if (parts.empty()) return true;
-  const LogSet rest = whole.differenceWith(parts);
+  const LogSet rest = whole.without(parts);
   return rest.empty() || hasEnough(rest);
 }
 

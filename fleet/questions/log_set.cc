@@ -10,13 +10,14 @@ std::size_t ones(std::uint64_t word) {
   return static_cast<std::size_t>(std::popcount(word));
 }
 
-/// The bits of [begin, end) that are set.
-std::size_t onesBetween(const std::vector<std::uint64_t>& words, LogIndex begin, LogIndex end) {
+/// The bits of the day's logs that are set; `wordAt` yields the words of a set.
+template <class WordAt>
+std::size_t onesOf(const LogTable::Day& day, const WordAt& wordAt) {
   std::size_t count = 0;
-  for (std::size_t word = begin / 64; word * 64 < end; ++word) {
-    std::uint64_t bits = words[word];
-    if (word == begin / 64) bits &= ~std::uint64_t{0} << begin % 64;
-    if (end - word * 64 < 64) bits &= (std::uint64_t{1} << (end - word * 64)) - 1;
+  for (std::size_t word = day.begin / 64; word * 64 < day.end; ++word) {
+    std::uint64_t bits = wordAt(word);
+    if (word == day.begin / 64) bits &= ~std::uint64_t{0} << day.begin % 64;
+    if (day.end - word * 64 < 64) bits &= (std::uint64_t{1} << (day.end - word * 64)) - 1;
     count += ones(bits);
   }
   return count;
@@ -48,26 +49,31 @@ std::size_t LogSet::logs() const {
 
 std::size_t LogSet::devices(const LogTable& table) const {
   std::size_t most = 0;
-  for (const LogTable::Day& day : table.days()) {
-    most = std::max(most, onesBetween(words_, day.begin, day.end));
-  }
+  for (const LogTable::Day& day : table.days())
+    most = std::max(most, onesOf(day, [&](std::size_t word) { return words_[word]; }));
   return most;
 }
 
 std::vector<std::size_t> LogSet::logsByDay(const LogTable& table) const {
   std::vector<std::size_t> counts;
   counts.reserve(table.days().size());
-  for (const LogTable::Day& day : table.days()) {
-    counts.push_back(onesBetween(words_, day.begin, day.end));
-  }
+  for (const LogTable::Day& day : table.days())
+    counts.push_back(onesOf(day, [&](std::size_t word) { return words_[word]; }));
   return counts;
 }
 
-LogSet LogSet::differenceWith(const LogSet& other) const {
+LogSet LogSet::without(const LogSet& other) const {
   LogSet result = *this;
   for (std::size_t i = 0; i < words_.size(); ++i)
-    result.words_[i] ^= other.words_[i];
+    result.words_[i] &= ~other.words_[i];
   return result;
+}
+
+bool LogSet::differsByAtLeast(const LogSet& other, std::size_t devices,
+                              const LogTable& table) const {
+  const auto isInOne = [&](std::size_t word) { return words_[word] ^ other.words_[word]; };
+  return std::any_of(table.days().begin(), table.days().end(),
+                     [&](const LogTable::Day& day) { return onesOf(day, isInOne) >= devices; });
 }
 
 std::size_t LogSet::hash() const {

@@ -40,8 +40,9 @@ class LogSet {
   /// The number of logs of each day of the table.
   std::vector<std::size_t> logsByDay(const LogTable& table) const;
 
-  /// What is in one of the two sets but not in both.
-  LogSet differenceWith(const LogSet& other) const;
+  LogSet without(const LogSet& other) const;
+  /// Whether the logs that only one of the two sets has are of at least so many devices.
+  bool differsByAtLeast(const LogSet& other, std::size_t devices, const LogTable& table) const;
   std::size_t hash() const;
 
  private:
