@@ -10,6 +10,7 @@
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/persisted_state.h"
+#include "platform/plist/encodable_text.h"
 #include "platform/plist/xml.h"
 #include "tools/device/known_preferences.h"
 #include "tools/shared/input_file.h"
@@ -132,7 +133,7 @@ void set(ToolContext& context, const Arguments& arguments) {
   }
   const auto value = valueOf(context, arguments);
   if (!value) return context.failUsage(value.error().message);
-  if (!isXmlText(arguments.key) || !hasXmlTextsOnly(*value)) {
+  if (!plist::isEncodable(arguments.key, plist::Alphabet::Xml) || !hasXmlTextsOnly(*value)) {
     return context.failUsage(
         "cannot be stored: property lists allow only UTF-8 without control characters: give such "
         "bytes as --plist '{\"$data\": \"BASE64\"}'");

@@ -6,7 +6,7 @@
 
 #include "base/format.h"
 #include "base/iso_date.h"
-#include "base/utf8.h"
+#include "platform/plist/encodable_text.h"
 
 namespace tavrel {
 namespace {
@@ -58,22 +58,13 @@ Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind) {
   return plist::Value(text);
 }
 
-bool isXmlText(std::string_view text) {
-  if (!isValidUtf8(text)) return false;
-  while (!text.empty()) {
-    const char32_t codePoint = takeCodePoint(text);
-    const bool isBlank = codePoint == '\t' || codePoint == '\n' || codePoint == '\r';
-    if ((codePoint < 0x20 && !isBlank) || codePoint == 0xFFFE || codePoint == 0xFFFF) return false;
-  }
-  return true;
-}
-
 bool hasXmlTextsOnly(const plist::Value& value) {
-  if (const auto text = value.string()) return isXmlText(*text);
+  if (const auto text = value.string()) return plist::isEncodable(*text, plist::Alphabet::Xml);
   const plist::Array array = value.array();
   if (!std::all_of(array.begin(), array.end(), hasXmlTextsOnly)) return false;
   for (const plist::Entry& entry : value.dictionary()) {
-    if (!isXmlText(entry.key) || !hasXmlTextsOnly(entry.value)) return false;
+    if (!plist::isEncodable(entry.key, plist::Alphabet::Xml) || !hasXmlTextsOnly(entry.value))
+      return false;
   }
   return true;
 }

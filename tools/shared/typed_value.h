@@ -14,9 +14,7 @@ enum class ArgumentKind : std::uint8_t { Text, Boolean, Integer, Real, Date };
 /// The error says what is expected.
 Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind);
 
-/// Whether XML can hold the text: UTF-8 without control characters except tabs and line ends.
-bool isXmlText(std::string_view text);
-/// Whether XML can hold all texts and keys in `value`.
+/// Whether an XML property list can hold all texts and keys in `value`.
 bool hasXmlTextsOnly(const plist::Value& value);
 
 }  // namespace tavrel
