@@ -12,7 +12,8 @@ namespace tavrel {
 inline constexpr std::int32_t kFirstDay = std::numeric_limits<std::int32_t>::min();
 inline constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
 
-/// Opens it for reading, with a note when something is missing.
+/// Opens it for reading. When something is missing, says so and makes the exit status 1; the rest
+/// can be read.
 Expected<RecordedHistory> openRecorded(ToolContext& context, RowSelection selection);
 
 }  // namespace tavrel
