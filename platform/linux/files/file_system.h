@@ -4,8 +4,8 @@
 // To replace a file, it writes and flushes a temporary file in the same folder, renames it over the
 // file and flushes the folder:
 //
-//   if (Status done = files.replace(path, bytes, 0644); !done) log.write(...,
-//   done.error().message);
+//   const Status done = files.replace(path, bytes, 0644);
+//   if (!done) log.write(LogLevel::Error, done.error().message);
 //
 // or piece by piece; a file that is not committed vanishes with its handle:
 //
@@ -13,8 +13,8 @@
 //   file->write(bytes);
 //   file->commit();
 //
-// All errors name the path and have the system's own words. The system calls are virtual: tests
-// derive a file system that loses unflushed data and one whose n-th call fails.
+// All errors name the path; those of a system call have its words. The system calls are virtual:
+// tests derive a file system that loses unflushed data and one whose n-th call fails.
 #pragma once
 
 #include <cstddef>
