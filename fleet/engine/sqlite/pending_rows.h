@@ -30,7 +30,8 @@ class RowSource {
 };
 
 /// Makes a table `name` of the columns id, a, b, c, d and e, whose rows are those of the source.
-/// The source must outlive the connection.
+/// The source must outlive every statement that reads the table; a later source of the same name
+/// replaces it.
 void addRowTable(const Connection& connection, const char* name, RowSource& source);
 
 void setResult(sqlite3_context* result, std::int64_t value, int column);
