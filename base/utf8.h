@@ -16,6 +16,10 @@ char32_t takeCodePoint(std::string_view& text);
 /// True when `text` is well-formed UTF-8 (shortest forms, no surrogates).
 bool isValidUtf8(std::string_view text);
 
+constexpr bool isPrintableAscii(char character) {
+  return character >= ' ' && character <= '~';
+}
+
 /// Appends a code point; surrogates and numbers beyond U+10FFFF become the replacement character.
 void appendCodePoint(std::string& out, char32_t codePoint);
 

@@ -4,6 +4,7 @@
 #include <charconv>
 #include <nlohmann/json.hpp>
 
+#include "base/utf8.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {
@@ -12,7 +13,7 @@ namespace {
 constexpr std::size_t kIndentOfLevel = 2;
 
 bool isPlain(char character) {
-  return character >= 0x20 && character < 0x7F && character != '"' && character != '\\';
+  return isPrintableAscii(character) && character != '"' && character != '\\';
 }
 
 template <class Integer>

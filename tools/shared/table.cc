@@ -49,8 +49,7 @@ std::string_view firstColumns(std::string_view text, std::size_t width) {
 }  // namespace
 
 std::string printable(std::string_view text) {
-  const auto isPlain = [](char character) { return character >= 0x20 && character < 0x7F; };
-  if (std::ranges::all_of(text, isPlain)) return std::string(text);
+  if (std::ranges::all_of(text, isPrintableAscii)) return std::string(text);
   std::string out;
   out.reserve(text.size());
   while (!text.empty()) {

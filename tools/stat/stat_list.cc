@@ -2,12 +2,12 @@
 
 #include <algorithm>
 #include <charconv>
-#include <nlohmann/json.hpp>
 #include <string_view>
 #include <vector>
 
 #include "base/utf8.h"
 #include "tools/shared/day_argument.h"
+#include "tools/shared/json_writer.h"
 #include "tools/shared/table.h"
 #include "tools/stat/line_writer.h"
 #include "tools/stat/recorded.h"
@@ -21,11 +21,6 @@ constexpr std::size_t kBytesMeasured = 256U << 10;
 
 constexpr std::string_view kNumbers = "-9223372036854775808";
 constexpr std::string_view kDistribution = "distribution";
-
-bool isPlain(std::string_view text) {
-  return std::all_of(text.begin(), text.end(),
-                     [](char c) { return c >= ' ' && c <= '~' && c != '"' && c != '\\'; });
-}
 
 // One statistic of one day: the value of a scalar, or how many values a distribution has.
 struct Row {
@@ -157,8 +152,9 @@ class TableWriter {
     const std::size_t taken = widths_.day + widths_.kind + widths_.value + 6;
     const std::size_t room =
         columns_ ? std::max(*columns_ - std::min(*columns_, taken), kNarrowestKey) : key.size() * 4;
-    const std::string escaped = isPlain(key) ? std::string() : printable(key);
-    std::string_view shown = escaped.empty() ? key : std::string_view(escaped);
+    const std::string escaped =
+        std::ranges::all_of(key, isPrintableAscii) ? std::string() : printable(key);
+    const std::string_view shown = escaped.empty() ? key : std::string_view(escaped);
     if (!columns_ || displayWidth(shown) <= room) {
       out += shown;
       return;
@@ -180,39 +176,6 @@ class TableWriter {
   std::vector<std::size_t> keySizes_;
   std::string keys_;
   std::string value_;
-};
-
-// The rows as elements of a JSON list, in the form that the JSON library gives the rest.
-class JsonWriter {
- public:
-  explicit JsonWriter(LineWriter& lines) : lines_(lines) {}
-
-  void beginList(std::string_view name) {
-    isEmpty_ = true;
-    lines_.buffer().append(",\n  \"").append(name).append("\": [");
-  }
-  void add(const Row& row) {
-    std::string& out = lines_.buffer();
-    out += isEmpty_ ? "\n    {\n      \"key\": " : ",\n    {\n      \"key\": ";
-    isEmpty_ = false;
-    if (isPlain(row.key)) {
-      out.append("\"").append(row.key).append("\"");
-    } else {
-      out += jsonText(Json(row.key), -1);
-    }
-    out += ",\n      \"day\": ";
-    appendNumber(out, row.day);
-    out.append(",\n      \"date\": \"").append(days_.date(row.day));
-    out += row.isScalar ? "\",\n      \"value\": " : "\",\n      \"count\": ";
-    appendNumber(out, row.number);
-    out += "\n    }";
-  }
-  void endList() { lines_.buffer() += isEmpty_ ? "]" : "\n  ]"; }
-
- private:
-  LineWriter& lines_;
-  DayTexts days_;
-  bool isEmpty_ = true;
 };
 
 // Passes each row to `add`, scalars first, and calls `between` after the scalars.
@@ -253,19 +216,30 @@ Status printTable(ToolContext& context, RecordedHistory& history) {
 
 Status printJson(ToolContext& context, RecordedHistory& history) {
   LineWriter lines(context.out());
-  JsonWriter json(lines);
-  std::string head = jsonText(withFormatVersion(Json::object()), 2);
-  head.resize(head.size() - 2);  // without the end of the object
-  lines.buffer() += head;
-  json.beginList("scalars");
+  DayTexts days;
+  JsonWriter json(0);
+  json.beginObject();
+  json.member("format_version").integer(std::int64_t{kJsonFormatVersion});
+  json.member("scalars").beginArray();
   const Status walked = walk(
-      history, lines, [&](const Row& row) { json.add(row); },
+      history, lines,
+      [&](const Row& row) {
+        json.element().beginObject();
+        json.member("key").text(row.key);
+        json.member("day").integer(std::int64_t{row.day});
+        json.member("date").text(days.date(row.day));
+        json.member(row.isScalar ? "value" : "count").integer(row.number);
+        json.endObject();
+        lines.buffer() += json.text();
+        json.clear();
+      },
       [&] {
-        json.endList();
-        json.beginList("distributions");
+        json.endArray();
+        json.member("distributions").beginArray();
       });
-  json.endList();
-  lines.buffer() += "\n}\n";
+  json.endArray();
+  json.endObject();
+  lines.buffer().append(json.text()) += '\n';
   return walked;
 }
 

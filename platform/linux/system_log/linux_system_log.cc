@@ -62,8 +62,7 @@ void appendField(std::string& out, std::string_view name, std::string_view value
 void appendPrintable(std::string& out, std::string_view text) {
   static constexpr char kDigits[] = "0123456789ABCDEF";
   while (true) {
-    const auto plain = std::ranges::find_if_not(
-        text, [](char character) { return character >= 0x20 && character < 0x7F; });
+    const auto plain = std::ranges::find_if_not(text, isPrintableAscii);
     out.append(text.begin(), plain);
     text.remove_prefix(static_cast<std::size_t>(plain - text.begin()));
     if (text.empty()) return;
