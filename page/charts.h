@@ -1,6 +1,6 @@
 // Charts as inline SVG with their texts as HTML around it, so that texts keep their size at any
 // width. Each chart has an accessible name, which also tells the figures that the eye would look
-// for first. Values that are not finite count as not told.
+// for first. Values that are not finite count as no data.
 #pragma once
 
 #include <functional>
@@ -17,7 +17,7 @@ namespace tavrel::page {
 /// How a chart writes its values; page/number_text.h has the usual ones.
 using NumberText = std::function<std::string(double value)>;
 
-/// Values over days. The line has gaps where nothing was told; a value between gaps is a dot.
+/// Values over days. The line has gaps where there is no data; a value between gaps is a dot.
 struct LineChart {
   std::string name;                           // accessible
   std::vector<std::optional<double>> values;  // a day each

@@ -92,9 +92,9 @@ std::string bandPath(const LineChart& chart, const Range& range) {
 }
 
 std::string nameOf(const LineChart& chart, const Range& line) {
-  if (line.told == 0) return chart.name + ": nothing told";
-  std::string name = format("%s: %s to %s, %zu of %zu days told, lowest %s, highest %s", chart.name,
-                            chart.first, chart.last, line.told, chart.values.size(),
+  if (line.told == 0) return chart.name + ": no data";
+  std::string name = format("%s: %s to %s, data for %zu of %zu days, lowest %s, highest %s",
+                            chart.name, chart.first, chart.last, line.told, chart.values.size(),
                             chart.text(line.low), chart.text(line.high));
   for (auto value = chart.values.rbegin(); value != chart.values.rend(); ++value) {
     if (!*value || !std::isfinite(**value)) continue;

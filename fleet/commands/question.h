@@ -71,7 +71,7 @@ std::string noMeanText();
 const char* kindText(const PartName& name);
 /// The members "part" and "group", which is null but for values.
 Json partJson(const PartName& name);
-/// A number for people: "-" for what is not told.
+/// A number for people: "-" for what is not available.
 std::string figureText(double value);
 
 /// A number for JSON: what is not finite is null there.

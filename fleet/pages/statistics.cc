@@ -56,7 +56,7 @@ std::string percentileText(const ShownSet& set, std::size_t index, std::string_v
 std::string meanText(const ShownSet& set, std::string_view unit) {
   const double mean =
       set.scalar ? set.scalar->mean : set.merged.value_or(MergedAnswer{}).numbers.mean;
-  return std::isfinite(mean) ? cellText(mean, unit) : "not told";
+  return std::isfinite(mean) ? cellText(mean, unit) : "not available";
 }
 
 void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& name,

@@ -7,7 +7,7 @@ std::string PartName::text() const {
     case PartKind::kWhole:
       return "(all)";
     case PartKind::kNotTold:
-      return "(not told)";
+      return "(not reported)";
     case PartKind::kOther:
       return "(other)";
     case PartKind::kValue:

@@ -18,8 +18,8 @@ struct PartName {
   std::string value = {};  ///< empty unless the kind is kValue
 
   bool isValue() const { return kind == PartKind::kValue; }
-  /// For people: "(all)", "(not told)", "(other)", or the value, in quotation marks when it begins
-  /// with a parenthesis or a quotation mark.
+  /// For people: "(all)", "(not reported)", "(other)", or the value, in quotation marks when it
+  /// begins with a parenthesis or a quotation mark.
   std::string text() const;
 };
 

@@ -178,7 +178,7 @@ TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   EXPECT_THAT(shown, HasSubstr("\n              DEVICES  MINIMUM        MEAN  MAXIMUM  NO MEAN\n"
                                "  (all)            40  "));
   EXPECT_THAT(shown, HasSubstr("\n  \"(other)\"        13  "));
-  EXPECT_THAT(shown, HasSubstr("\n  (not told)       13  "));
+  EXPECT_THAT(shown, HasSubstr("\n  (not reported)       13  "));
   EXPECT_THAT(shown, HasSubstr("\n  No room for STD DEVIATION, LOGS, VALUES, 25 %, 75 %, MINIMUM, "
                                "MAXIMUM, 5 %, 95 %: widen the terminal\n"));
   EXPECT_THAT(shown, HasSubstr("\n  NO MEAN counts logs that means and deviations leave out"));

@@ -109,7 +109,7 @@ TEST(LineChartTest, HasGapsDotsAndABand) {
   EXPECT_EQ(attributes(line, "d"), "M0 100l1 -100M3 50h0M5 0l1 25 1 25\n");
   EXPECT_EQ(attributes(line, "viewBox"), "0 0 7 100\n");
   EXPECT_EQ(attributes(line, "aria-label"),
-            "K: first to last, 6 of 8 days told, lowest 0, highest 10, last 5\n");
+            "K: first to last, data for 6 of 8 days, lowest 0, highest 10, last 5\n");
   chart.values = {5, 5, {}, 5};
   chart.lows = {0, 2.5, {}, 0};
   chart.highs = {10, 7.5, {}, 10};
@@ -119,7 +119,7 @@ TEST(LineChartTest, HasGapsDotsAndABand) {
   chart = {"K", {{}, {}}, {}, {}, "a", "b", chart.text};
   HtmlWriter nothing;
   writeLineChart(nothing, chart);
-  EXPECT_EQ(attributes(nothing, "aria-label") + attributes(nothing, "d"), "K: nothing told\n");
+  EXPECT_EQ(attributes(nothing, "aria-label") + attributes(nothing, "d"), "K: no data\n");
   chart.values = {-1.7e308, 1.7e308, 0};
   HtmlWriter wide;
   writeLineChart(wide, chart);
