@@ -28,9 +28,9 @@ std::string textOf(const DayRange& days) {
 }
 
 Expected<DayRange> parseDayRange(std::string_view text, std::int32_t newest) {
-  const Error fault{"\"" + std::string(text) +
-                    "\" is no range of days: write FIRST..LAST with days as YYYY-MM-DD, or a count "
-                    "of days"};
+  const Error fault{
+      "\"" + std::string(text) +
+      "\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or a count of days"};
   std::uint32_t count = 0;
   const char* const end = text.data() + text.size();
   if (const auto [rest, error] = std::from_chars(text.data(), end, count);

@@ -252,29 +252,28 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
     std::vector<std::string> arguments;
     int status;
     const char* message;
-  } cases[] = {{{"show", "x\x1b"},
-                1,
-                "statistic \"x\\x1b\" is in no log: tavrel-fleet summary --keys lists all"},
-               {{"show", "=sum", "--against", "1"},
-                2,
-                "--against: 2026-11-24 and all days overlap: name days apart with --days"},
-               {{"show", "=sum", "--against", "5.0"},
-                1,
-                "version \"5.0\" is in no log: tavrel-fleet summary lists the versions"},
-               {{"compare", "OS", "4.10"},
-                1,
-                "version \"OS\" is part of several versions: write the whole of one of them"},
-               {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
-               {{"summary", "--days", "0"},
-                2,
-                "--days: \"0\" is no range of days: write FIRST..LAST with days as YYYY-MM-DD, or "
-                "a count of "
-                "days"},
-               {{"summary", "--devices-at-least", "2"},
-                2,
-                "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
-                "can tell the "
-                "figures of another"}};
+  } cases[] = {
+      {{"show", "x\x1b"},
+       1,
+       "statistic \"x\\x1b\" is in no log: tavrel-fleet summary --keys lists all"},
+      {{"show", "=sum", "--against", "1"},
+       2,
+       "--against: 2026-11-24 and all days overlap: name days apart with --days"},
+      {{"show", "=sum", "--against", "5.0"},
+       1,
+       "version \"5.0\" is in no log: tavrel-fleet summary lists the versions"},
+      {{"compare", "OS", "4.10"},
+       1,
+       "version \"OS\" is part of several versions: write the whole of one of them"},
+      {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
+      {{"summary", "--days", "0"},
+       2,
+       "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or "
+       "a count of days"},
+      {{"summary", "--devices-at-least", "2"},
+       2,
+       "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
+       "can tell the figures of another"}};
   for (const auto& [arguments, status, message] : cases) {
     const Output output = run(file, arguments);
     EXPECT_EQ(output.error, "tavrel-fleet: " + std::string(message) + "\n");

@@ -191,9 +191,10 @@ TEST(CatalogueTest, RefusesBrokenDocuments) {
       {head + "| `a.b` | count | now | X. |\n", "5: the meaning is empty or ends with a full stop"},
       {head + "| `a.b` | count | now | [X] |\n",
        "5: meaning: no backtick, quotation mark, backslash or bracket inside a cell"},
-      {head + "| `a*b` | count | now | X |\n", "5: 'a*b' is no key with at most two placeholders"},
+      {head + "| `a*b` | count | now | X |\n",
+       "5: 'a*b' is not a key with at most two placeholders"},
       {head + "| `<a>.<b>.<c>` | count | now | X |\n",
-       "5: '<a>.<b>.<c>' is no key with at most two placeholders"},
+       "5: '<a>.<b>.<c>' is not a key with at most two placeholders"},
       {"| key | meaning |\n", "1: no table of the catalogue has these columns"},
   };
   for (const auto& [document, fault] : cases) {
