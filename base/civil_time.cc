@@ -1,7 +1,8 @@
 #include "base/civil_time.h"
 
-#include <charconv>
 #include <cstdio>
+
+#include "base/parse_number.h"
 
 namespace tavrel {
 namespace {
@@ -22,12 +23,7 @@ bool isLeapYear(std::int64_t year) {
 }
 
 std::optional<std::int64_t> parseDigits(std::string_view text) {
-  std::int64_t value = 0;
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), value);
-  if (error != std::errc{} || end != text.data() + text.size() || text.front() == '-') {
-    return std::nullopt;
-  }
-  return value;
+  return text.starts_with('-') ? std::nullopt : parseNumber<std::int64_t>(text);
 }
 
 }  // namespace

@@ -6,6 +6,7 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "base/text.h"
 
 namespace tavrel {
@@ -15,15 +16,6 @@ constexpr auto kEpoch = static_cast<std::int64_t>(plist::Date::kEpoch);
 
 // Seconds from the epoch to the ends of the calendar of base/civil_time.h, rounded up.
 constexpr double kLargestSeconds = 3.2e16;
-
-template <class Number>
-std::optional<Number> parseNumber(std::string_view text) {
-  Number value{};
-  const char* const textEnd = text.data() + text.size();
-  const auto [end, error] = std::from_chars(text.data(), textEnd, value);
-  if (text.empty() || error != std::errc{} || end != textEnd) return std::nullopt;
-  return value;
-}
 
 // Two digits at `position` that do not exceed `largest`.
 std::optional<unsigned> parseTwoDigits(std::string_view text, std::size_t position,

@@ -1,5 +1,4 @@
 // tavrel-statsd: records what programs send as StatsD datagrams.
-#include <charconv>
 #include <cstdio>
 #include <exception>
 #include <getopt.h>
@@ -8,6 +7,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "base/version.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
@@ -41,12 +41,6 @@ void complain(std::string_view message) {
   std::fprintf(stderr, "tavrel-statsd: %s\n", std::string(message).c_str());
 }
 
-template <class Number>
-bool parse(std::string_view text, Number most, Number& number) {
-  const auto [stop, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-  return error == std::errc() && stop == text.data() + text.size() && number <= most;
-}
-
 // An exit status when the program is not to run.
 std::optional<int> parseOptions(int argc, char** argv, Options& options) {
   enum : int { kUdp = 256, kUnix, kPrefix, kIdle, kShowHelp, kVersion };
@@ -62,13 +56,13 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
     return 2;
   };
   for (int found = 0; (found = getopt_long(argc, argv, "h", kOptions, nullptr)) != -1;) {
-    std::uint16_t port = 0;
     switch (found) {
-      case kUdp:
-        if (!parse(optarg, std::uint16_t{65535}, port) || port == 0)
-          return misuse(format("not a port: %s: give 1 to 65535", optarg));
-        options.ports.push_back(port);
+      case kUdp: {
+        const auto port = parseNumber<std::uint16_t>(optarg);
+        if (port.value_or(0) == 0) return misuse(format("not a port: %s: give 1 to 65535", optarg));
+        options.ports.push_back(*port);
         break;
+      }
       case kUnix:
         options.paths.emplace_back(optarg);
         break;
@@ -81,10 +75,13 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
         }
         options.prefix = optarg;
         break;
-      case kIdle:
-        if (!parse(optarg, kLongestIdle, options.idleSeconds))
+      case kIdle: {
+        const auto seconds = parseNumber<std::uint32_t>(optarg);
+        if (!seconds || *seconds > kLongestIdle)
           return misuse(format("not a time: %s: give 0 to %u seconds", optarg, kLongestIdle));
+        options.idleSeconds = *seconds;
         break;
+      }
       case kVersion:
         std::printf("tavrel-statsd %s\n", std::string(version()).c_str());
         return 0;

@@ -1,7 +1,8 @@
 #include "statsd/statsd_line.h"
 
-#include <charconv>
 #include <cmath>
+
+#include "base/parse_number.h"
 
 namespace tavrel {
 namespace {
@@ -13,18 +14,19 @@ std::string_view takeUntil(std::string_view& rest, char end) {
   return part;
 }
 
-bool parseNumber(std::string_view text, double& number) {
+bool parseFinite(std::string_view text, double& number) {
   if (text.starts_with('+')) {
     text.remove_prefix(1);
     if (text.starts_with('-')) return false;
   }
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, number);
-  return error == std::errc() && stop == end && std::isfinite(number);
+  const auto value = parseNumber<double>(text);
+  if (!value || !std::isfinite(*value)) return false;
+  number = *value;
+  return true;
 }
 
 bool parseRate(std::string_view text, double& rate) {
-  return parseNumber(text, rate) && rate > 0 && rate <= 1;
+  return parseFinite(text, rate) && rate > 0 && rate <= 1;
 }
 
 // Fields with tags, the sender's container or its time.
@@ -70,7 +72,7 @@ StatsdParse parseStatsdLine(std::string_view text, StatsdLine& result) {
   result.values.clear();
   do {
     double value = 0;
-    if (!parseNumber(takeUntil(values, ':'), value)) return StatsdParse::Malformed;
+    if (!parseFinite(takeUntil(values, ':'), value)) return StatsdParse::Malformed;
     result.values.push_back(value);
   } while (!values.empty());
   const bool isGauge = result.kind == StatsdKind::Gauge || result.kind == StatsdKind::GaugeDelta;

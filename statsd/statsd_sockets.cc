@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <charconv>
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
@@ -16,6 +15,7 @@
 #include <unistd.h>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 
 namespace tavrel {
 namespace {
@@ -32,11 +32,8 @@ constexpr int kReceiveBuffer = 1 << 20;
 std::optional<int> numberFromEnvironment(const char* variable) {
   const char* const text = std::getenv(variable);
   if (text == nullptr) return std::nullopt;
-  int number = 0;
-  const char* const end = text + std::strlen(text);
-  const auto [stop, error] = std::from_chars(text, end, number);
-  if (error != std::errc() || stop != end || number <= 0) return std::nullopt;
-  return number;
+  const auto number = parseNumber<int>(text);
+  return number && *number > 0 ? number : std::nullopt;
 }
 
 bool isDatagramSocket(int descriptor) {

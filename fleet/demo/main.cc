@@ -1,5 +1,4 @@
 // tavrel-fleet-demo DEVICES DAYS FOLDER: the logs of a simulated fleet, as a server receives them.
-#include <charconv>
 #include <filesystem>
 #include <fstream>
 #include <iostream>
@@ -9,6 +8,7 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "fleet/demo/simulated_device.h"
 
 namespace {
@@ -19,10 +19,7 @@ using namespace tavrel::fleet;
 constexpr std::int32_t kLastDay = 20781;  // 2026-11-24
 
 std::int32_t numberOf(const std::string& text) {
-  std::int32_t number = 0;
-  const char* const end = text.data() + text.size();
-  const auto [rest, error] = std::from_chars(text.data(), end, number);
-  return error == std::errc() && rest == end ? number : 0;
+  return parseNumber<std::int32_t>(text).value_or(0);
 }
 
 void write(const std::filesystem::path& path, const std::string& content) {

@@ -1,9 +1,9 @@
 #include "fleet/questions/day_range.h"
 
-#include <charconv>
 #include <optional>
 
 #include "base/civil_time.h"
+#include "base/parse_number.h"
 
 namespace tavrel::fleet {
 
@@ -31,12 +31,9 @@ Expected<DayRange> parseDayRange(std::string_view text, std::int32_t newest) {
   const Error fault{
       "\"" + std::string(text) +
       "\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or a count of days"};
-  std::uint32_t count = 0;
-  const char* const end = text.data() + text.size();
-  if (const auto [rest, error] = std::from_chars(text.data(), end, count);
-      error == std::errc() && rest == end) {
-    const std::int64_t first = static_cast<std::int64_t>(newest) - count + 1;
-    if (count == 0 || first < DayRange{}.first) return fault;
+  if (const auto count = parseNumber<std::uint32_t>(text)) {
+    const std::int64_t first = static_cast<std::int64_t>(newest) - *count + 1;
+    if (*count == 0 || first < DayRange{}.first) return fault;
     return DayRange{static_cast<std::int32_t>(first), newest};
   }
 

@@ -5,6 +5,8 @@
 #include <cstdint>
 #include <limits>
 
+#include "base/parse_number.h"
+
 namespace tavrel::plist {
 namespace {
 
@@ -13,16 +15,6 @@ void append(std::string& out, Value value) {
   char digits[32];
   const auto [end, error] = std::to_chars(digits, digits + sizeof digits, value);
   out.append(digits, end);
-}
-
-// Reads the whole text.
-template <class Value, class... Options>
-std::optional<Value> parse(std::string_view text, Options... options) {
-  Value value{};
-  const char* const textEnd = text.data() + text.size();
-  const auto [end, error] = std::from_chars(text.data(), textEnd, value, options...);
-  if (error != std::errc{} || end != textEnd) return std::nullopt;
-  return value;
 }
 
 bool take(std::string_view& text, char first) {
@@ -57,7 +49,7 @@ std::optional<Number> parseInteger(std::string_view text) {
   const bool negative = take(text, '-');
   if (!negative) take(text, '+');
   const bool hexadecimal = takeHexadecimalMark(text);
-  const auto magnitude = parse<std::uint64_t>(text, hexadecimal ? 16 : 10);
+  const auto magnitude = parseNumber<std::uint64_t>(text, hexadecimal ? 16 : 10);
   if (!magnitude) return std::nullopt;
   constexpr auto kLargest = std::uint64_t{std::numeric_limits<std::int64_t>::max()};
   if (negative) {
@@ -71,7 +63,7 @@ std::optional<Number> parseInteger(std::string_view text) {
 std::optional<double> parseReal(std::string_view text) {
   if (take(text, '+') && text.starts_with('-')) return std::nullopt;
   if (text.ends_with(')')) return std::nullopt;  // "nan(...)"
-  return parse<double>(text);
+  return parseNumber<double>(text);
 }
 
 }  // namespace tavrel::plist

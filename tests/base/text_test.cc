@@ -8,6 +8,7 @@
 #include <string>
 
 #include "base/civil_time.h"
+#include "base/parse_number.h"
 #include "base/quantity_text.h"
 #include "base/utf8.h"
 #include "base/uuid.h"
@@ -45,6 +46,19 @@ TEST(Text, WritesObjectsAsPeopleReadThem) {
   EXPECT_EQ(dateText(plist::Date::since1970(-1e300)), "@-1e+300");
   EXPECT_EQ(textOf(plist::Data(ByteSpan())), "<>");
   EXPECT_EQ(textOf({}), "(null)");
+}
+
+TEST(ParseNumber, TakesTextsThatAreNothingElse) {
+  EXPECT_EQ(parseNumber<std::int8_t>("-128"), -128);
+  EXPECT_EQ(parseNumber<std::uint8_t>("0255"), 255);
+  EXPECT_EQ(parseNumber<unsigned>("fF", 16), 255U);
+  EXPECT_EQ(parseNumber<double>("-2.5e-1"), -0.25);
+  EXPECT_EQ(parseNumber<double>("inf"), INFINITY);
+  for (const char* text : {"", "-", "+1", " 1", "1 ", "1x", "0x1", "-129", "128"})
+    EXPECT_EQ(parseNumber<std::int8_t>(text), std::nullopt) << text;
+  EXPECT_EQ(parseNumber<unsigned>("-1"), std::nullopt);
+  for (const char* text : {"", "+1", "1e", "0x1", "1e999"})
+    EXPECT_EQ(parseNumber<double>(text), std::nullopt) << text;
 }
 
 TEST(CivilTime, EveryDayOf32BitsHasADate) {

@@ -1,6 +1,5 @@
 #include "tools/nand/nand_build.h"
 
-#include <charconv>
 #include <cstdint>
 #include <limits>
 #include <optional>
@@ -8,6 +7,7 @@
 #include <unordered_map>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "storage/parse/statistic_keys.h"
 #include "tools/shared/value_text.h"
 
@@ -82,10 +82,9 @@ class Builder {
     const std::string_view digits = name.substr(stem);
     if (digits.empty() || (digits.size() > 1 && digits[0] == '0')) return std::nullopt;
     const auto at = byName_.find(name.substr(0, stem));
-    std::uint32_t index = 0;
-    const auto [end, error] = std::from_chars(digits.data(), digits.data() + digits.size(), index);
-    if (at == byName_.end() || error != std::errc()) return std::nullopt;
-    return Element{at->second, index};
+    const auto index = parseNumber<std::uint32_t>(digits);
+    if (at == byName_.end() || !index) return std::nullopt;
+    return Element{at->second, *index};
   }
 
   Expected<std::uint32_t> keyOf(const plist::Value& statistic) const {

@@ -1,7 +1,6 @@
 #include "tools/report/report_commands.h"
 
 #include <algorithm>
-#include <charconv>
 #include <chrono>
 #include <memory>
 #include <nlohmann/json.hpp>
@@ -11,6 +10,7 @@
 #include <utility>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "ioreport/ioreport.h"
 #include "tools/report/report_delta.h"
 #include "tools/report/report_json.h"
@@ -150,18 +150,13 @@ void describe(ToolContext& context, const Arguments& arguments) {
 // What is wrong with the text of an option; nothing when it is good.
 
 std::string secondsFault(const std::string& text) {
-  double seconds = 0;
-  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), seconds);
-  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
-  if (isNumber && seconds >= 0 && seconds <= kLongestInterval) return {};
+  const auto seconds = parseNumber<double>(text);
+  if (seconds && *seconds >= 0 && *seconds <= kLongestInterval) return {};
   return format("not a number of seconds: %s: give 0 to 86400, such as 0.5", text);
 }
 
 std::string countFault(const std::string& text) {
-  std::uint32_t count = 0;
-  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), count);
-  const bool isNumber = fault == std::errc{} && end == text.data() + text.size();
-  if (isNumber && count > 0) return {};
+  if (parseNumber<std::uint32_t>(text).value_or(0) > 0) return {};
   return format("not a number of samples: %s: give 1 or more", text);
 }
 

@@ -1,12 +1,12 @@
 #include "tools/report/report_selection.h"
 
 #include <algorithm>
-#include <charconv>
 #include <iterator>
 #include <unordered_set>
 #include <utility>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -173,11 +173,7 @@ std::string formatName(std::uint8_t format) {
 std::optional<std::uint64_t> parseWord(std::string_view text) {
   const bool isHexadecimal = text.starts_with("0x") || text.starts_with("0X");
   if (isHexadecimal) text.remove_prefix(2);
-  std::uint64_t word = 0;
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, word, isHexadecimal ? 16 : 10);
-  if (text.empty() || error != std::errc() || stop != end) return std::nullopt;
-  return word;
+  return parseNumber<std::uint64_t>(text, isHexadecimal ? 16 : 10);
 }
 
 }  // namespace tavrel

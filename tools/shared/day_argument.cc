@@ -1,10 +1,10 @@
 #include "tools/shared/day_argument.h"
 
-#include <charconv>
 #include <limits>
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/parse_number.h"
 
 namespace tavrel {
 
@@ -12,11 +12,7 @@ Expected<std::int32_t> parseDay(std::string_view text, std::optional<std::int32_
   if (today && text == "today") return *today;
   if (today && text == "yesterday") return previousDay(*today);
 
-  std::int32_t day = 0;
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, day);
-  if (error == std::errc() && stop == end) return day;
-
+  if (const auto day = parseNumber<std::int32_t>(text)) return *day;
   if (const auto date = parseDate(text)) {
     const std::int64_t days = daysFromCivil(*date);
     if (days >= std::numeric_limits<std::int32_t>::min() &&

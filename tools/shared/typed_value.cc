@@ -1,24 +1,15 @@
 #include "tools/shared/typed_value.h"
 
 #include <algorithm>
-#include <charconv>
 #include <optional>
 
 #include "base/format.h"
 #include "base/iso_date.h"
+#include "base/parse_number.h"
 #include "platform/plist/encodable_text.h"
 
 namespace tavrel {
 namespace {
-
-template <class Number>
-std::optional<Number> wholeNumber(std::string_view text) {
-  Number value{};
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, value);
-  if (text.empty() || error != std::errc() || stop != end) return std::nullopt;
-  return value;
-}
 
 Error notA(std::string_view what, std::string_view text, std::string_view expected) {
   return Error{format("not %s: %s: give %s", what, text, expected)};
@@ -43,11 +34,11 @@ Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind) {
     case ArgumentKind::Boolean:
       return parseBoolean(text);
     case ArgumentKind::Integer:
-      if (const auto number = wholeNumber<std::int64_t>(text)) return plist::Value(*number);
-      if (const auto number = wholeNumber<std::uint64_t>(text)) return plist::Value(*number);
+      if (const auto number = parseNumber<std::int64_t>(text)) return plist::Value(*number);
+      if (const auto number = parseNumber<std::uint64_t>(text)) return plist::Value(*number);
       return notA("an integer", text, "a decimal number of at most 64 bits");
     case ArgumentKind::Real:
-      if (const auto number = wholeNumber<double>(text)) return plist::Value(*number);
+      if (const auto number = parseNumber<double>(text)) return plist::Value(*number);
       return notA("a real number", text, "a number such as 2.5, 1e-3, inf or nan");
     case ArgumentKind::Date: {
       const auto date = parseIsoDate(text);

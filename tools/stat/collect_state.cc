@@ -16,6 +16,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "platform/linux/files/file_system.h"
 
 namespace tavrel {
@@ -40,19 +41,13 @@ std::vector<std::string_view> takeWords(std::string_view& text) {
   return words;
 }
 
-template <class Number>
-bool parse(std::string_view text, Number& number) {
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, number);
-  return error == std::errc() && stop == end;
-}
-
 template <class Pair>
 bool parsePair(const std::vector<std::string_view>& words, std::optional<Pair>& pair) {
-  std::uint64_t first = 0;
-  std::uint64_t second = 0;
-  if (words.size() != 3 || !parse(words[1], first) || !parse(words[2], second)) return false;
-  pair = Pair{first, second};
+  if (words.size() != 3) return false;
+  const auto first = parseNumber<std::uint64_t>(words[1]);
+  const auto second = parseNumber<std::uint64_t>(words[2]);
+  if (!first || !second) return false;
+  pair = Pair{*first, *second};
   return true;
 }
 
@@ -71,15 +66,15 @@ bool parseLine(const std::vector<std::string_view>& words, Parsed& parsed) {
     return true;
   }
   if (words[0] == "at" && words.size() == 2) {
-    std::int64_t nanoseconds = 0;
-    if (!parse(words[1], nanoseconds) || nanoseconds < 0) return false;
-    state.at = std::chrono::nanoseconds(nanoseconds);
+    const auto nanoseconds = parseNumber<std::int64_t>(words[1]);
+    if (!nanoseconds || *nanoseconds < 0) return false;
+    state.at = std::chrono::nanoseconds(*nanoseconds);
     return true;
   }
   if (words[0] == "remainder" && words.size() == 3) {
-    double number = 0;
-    if (!parse(words[2], number) || !(number >= 0 && number < 1)) return false;
-    state.remainders[std::string(words[1])] = number;
+    const auto number = parseNumber<double>(words[2]);
+    if (!number || !(*number >= 0 && *number < 1)) return false;
+    state.remainders[std::string(words[1])] = *number;
     return true;
   }
   return false;

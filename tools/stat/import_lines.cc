@@ -6,6 +6,7 @@
 #include "base/civil_time.h"
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/parse_number.h"
 #include "base/utf8.h"
 #include "tools/shared/day_argument.h"
 #include "tools/stat/import_number.h"
@@ -28,13 +29,6 @@ bool takeField(std::string_view& rest, std::string_view& field) {
   field = rest.substr(0, tab);
   rest.remove_prefix(tab + 1);
   return true;
-}
-
-template <class Integer>
-bool parseInteger(std::string_view text, Integer& value) {
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, value);
-  return error == std::errc() && stop == end;
 }
 
 bool isUtf8(std::string_view text) {
@@ -93,14 +87,16 @@ Expected<ImportLine> parseImportLine(std::string_view line, std::int32_t today) 
   if (!isUtf8(result.key)) return Error{format("a key is not UTF-8: %s", shortened(result.key))};
 
   if (isScalar) {
-    if (!parseInteger(rest, result.integer)) {
-      return Error{format("not a 64-bit integer: %s", shortened(rest))};
-    }
+    const auto integer = parseNumber<std::int64_t>(rest);
+    if (!integer) return Error{format("not a 64-bit integer: %s", shortened(rest))};
+    result.integer = *integer;
     return result;
   }
-  if (!parseInteger(seconds, result.seconds) || result.seconds >= kSecondsPerDay) {
+  const auto secondsInDay = parseNumber<std::uint32_t>(seconds);
+  if (!secondsInDay || *secondsInDay >= kSecondsPerDay) {
     return Error{format("seconds within the day are 0 to 86399, not: %s", shortened(seconds))};
   }
+  result.seconds = *secondsInDay;
   const auto value = parseExactDouble(rest);
   if (!value) return value.error();
   result.value = *value;

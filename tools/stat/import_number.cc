@@ -10,6 +10,7 @@
 #include <strings.h>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 
 namespace tavrel {
 namespace {
@@ -47,10 +48,8 @@ std::optional<double> parseNan(std::string_view text) {
 }  // namespace
 
 Expected<double> parseExactDouble(std::string_view text) {
-  double value = 0;
-  const char* const end = text.data() + text.size();
-  const auto [stop, error] = std::from_chars(text.data(), end, value);
-  if (error == std::errc() && stop == end && !std::isnan(value)) return value;
+  const auto plain = parseNumber<double>(text);
+  if (plain && !std::isnan(*plain)) return *plain;
 
   // Forms that are rare enough to be copied.
   constexpr std::string_view kBlanks = " \t\n\v\f\r";
@@ -59,7 +58,7 @@ Expected<double> parseExactDouble(std::string_view text) {
   if (const auto nan = parseNan(text.substr(first))) return *nan;
   const std::string copy(text.substr(first));
   char* copyEnd = nullptr;
-  value = std::strtod(copy.c_str(), &copyEnd);
+  const double value = std::strtod(copy.c_str(), &copyEnd);
   if (copyEnd != copy.c_str() + copy.size()) return Error{format("not a number: %s", text)};
   const bool isWritten = copy.find_first_of("iI") != std::string::npos;
   if (std::isinf(value) && !isWritten) {

@@ -1,10 +1,10 @@
 #include "tools/stat/record_commands.h"
 
-#include <charconv>
 #include <memory>
 #include <vector>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "tools/stat/import_number.h"
 #include "tools/stat/value_recorder.h"
 
@@ -37,14 +37,12 @@ bool checkKey(ToolContext& context, const std::string& key) {
 template <Status (ValueRecorder::*operation)(ValueTime, const std::string&, std::int64_t)>
 void changeScalar(ToolContext& context, const Arguments& arguments) {
   if (!checkKey(context, arguments.key)) return;
-  std::int64_t number = 0;
-  const char* const end = arguments.number.data() + arguments.number.size();
-  const auto [stop, error] = std::from_chars(arguments.number.data(), end, number);
-  if (error != std::errc() || stop != end) {
+  const auto number = parseNumber<std::int64_t>(arguments.number);
+  if (!number) {
     return context.failUsage(format("not a 64-bit integer: %s", arguments.number));
   }
   keep(context, [&](ValueRecorder& recorder, ValueTime now) {
-    return (recorder.*operation)(now, arguments.key, number);
+    return (recorder.*operation)(now, arguments.key, *number);
   });
 }
 

@@ -1,9 +1,9 @@
 #include "tools/stat/stat_commands.h"
 
-#include <charconv>
 #include <memory>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
 #include "tools/stat/collect.h"
@@ -50,9 +50,7 @@ Command addCommand(Command group, const char* name, const char* description,
 }
 
 bool isPositiveNumber(const std::string& text) {
-  std::uint32_t number = 0;
-  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), number);
-  return fault == std::errc{} && end == text.data() + text.size() && number > 0;
+  return parseNumber<std::uint32_t>(text).value_or(0) > 0;
 }
 
 // What is wrong with the text of --days and --every; nothing when it is good.

@@ -1,12 +1,12 @@
 #include "fleet/engine/clickhouse/address.h"
 
 #include <algorithm>
-#include <charconv>
 #include <curl/curl.h>
 #include <fstream>
 #include <iterator>
 #include <memory>
 
+#include "base/parse_number.h"
 #include "fleet/engine/engine.h"
 
 namespace tavrel::fleet {
@@ -56,14 +56,12 @@ std::string passwordIn(const std::string& path) {
 }
 
 int numberIn(const std::string& name, std::string_view text, int lowest, int highest) {
-  int number = 0;
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-  if (error != std::errc() || end != text.data() + text.size() || number < lowest ||
-      number > highest) {
+  const auto number = parseNumber<int>(text);
+  if (!number || *number < lowest || *number > highest) {
     refuse("needs a number from " + std::to_string(lowest) + " to " + std::to_string(highest) +
            " as its " + name);
   }
-  return number;
+  return *number;
 }
 
 std::string decoded(std::string_view text) {

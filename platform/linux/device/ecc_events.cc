@@ -3,13 +3,13 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <charconv>
 #include <optional>
 #include <utility>
 
 #include "base/bytes.h"
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/parse_number.h"
 #include "base/uuid.h"
 #include "platform/linux/files/property_list_file.h"
 
@@ -43,11 +43,7 @@ std::string_view withoutLineEnd(std::string_view text) {
 
 /// A decimal number, with or without a line end.
 std::optional<std::uint64_t> numberIn(std::string_view text) {
-  text = withoutLineEnd(text);
-  std::uint64_t number = 0;
-  const auto [end, fault] = std::from_chars(text.data(), text.data() + text.size(), number);
-  if (fault != std::errc{} || end != text.data() + text.size() || text.empty()) return std::nullopt;
-  return number;
+  return parseNumber<std::uint64_t>(withoutLineEnd(text));
 }
 
 /// 0 when the text is not an error number.

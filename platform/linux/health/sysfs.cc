@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <array>
-#include <charconv>
 #include <cstdlib>
 #include <fcntl.h>
 #include <filesystem>
@@ -10,6 +9,7 @@
 #include <sys/stat.h>
 #include <system_error>
 
+#include "base/parse_number.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/line_reader.h"
 
@@ -35,11 +35,8 @@ std::optional<std::string> readAttribute(const std::string& path) {
 }
 
 std::optional<std::int64_t> decimalOf(std::string_view text) {
-  std::int64_t value = 0;
-  const char* const end = text.data() + text.size();
-  const auto [stop, fault] = std::from_chars(text.data(), end, value);
-  if (fault != std::errc() || stop != end || value < 0) return std::nullopt;
-  return value;
+  const auto value = parseNumber<std::int64_t>(text);
+  return value && *value >= 0 ? value : std::nullopt;
 }
 
 std::optional<std::int64_t> readNumber(const std::string& path) {

@@ -1,7 +1,6 @@
 #include "platform/linux/service/socket_activation.h"
 
 #include <cerrno>
-#include <charconv>
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
@@ -12,6 +11,7 @@
 #include <vector>
 
 #include "base/limits.h"
+#include "base/parse_number.h"
 
 namespace tavrel {
 
@@ -23,11 +23,8 @@ constexpr int kFirstDescriptor = 3;
 std::optional<int> numberFromEnvironment(const char* variable) {
   const char* text = std::getenv(variable);
   if (!text) return std::nullopt;
-  const char* end = text + std::strlen(text);
-  int number = 0;
-  const auto [stop, error] = std::from_chars(text, end, number);
-  if (error != std::errc() || stop != end || number <= 0) return std::nullopt;
-  return number;
+  const auto number = parseNumber<int>(text);
+  return number && *number > 0 ? number : std::nullopt;
 }
 
 std::vector<std::string> namesFromEnvironment() {
