@@ -5,6 +5,7 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "page/charts.h"
+#include "page/drawing.h"
 #include "page/number_text.h"
 
 namespace tavrel::page {
@@ -40,13 +41,6 @@ void writeRectangle(HtmlWriter& html, const Rectangle& rectangle, double opacity
   }
 }
 
-void beginDrawing(HtmlWriter& html, std::string_view name, int width, int height) {
-  html.begin("svg", {{"role", "img"},
-                     {"aria-label", name},
-                     {"viewBox", format("0 0 %d %d", width, height)},
-                     {"preserveAspectRatio", "none"}});
-}
-
 // Of part `index` among so many: neighbours differ, in any number and in both colour schemes.
 double opacityOf(std::size_t index, std::size_t count) {
   constexpr double kFaintest = 0.25;
@@ -70,7 +64,7 @@ void writeHistogram(HtmlWriter& html, const Histogram& histogram) {
                     : "no values";
   html.begin("div", {{"class", "histogram"}});
   html.element("span", shortNumber(most.count), {{"class", "top"}});
-  beginDrawing(html, name, static_cast<int>(histogram.cells.size()) * kCell, kLength);
+  beginDrawing(html, name, histogram.cells.size() * kCell, kLength);
   int left = 0;
   for (const Histogram::Cell& cell : histogram.cells) {
     const int height = barLength(cell.count, most.count);

@@ -3,6 +3,7 @@
 
 #include "base/format.h"
 #include "page/charts.h"
+#include "page/drawing.h"
 
 namespace tavrel::page {
 namespace {
@@ -31,10 +32,7 @@ void writeRow(HtmlWriter& html, const IntervalChart& chart, const IntervalChart:
   html.begin("span");
   html.name(row.label);
   html.end();
-  html.begin("svg", {{"role", "img"},
-                     {"aria-label", format("%s: %s", row.label, row.text)},
-                     {"viewBox", format("0 0 %d %d", kLength, kHeight)},
-                     {"preserveAspectRatio", "none"}});
+  beginDrawing(html, format("%s: %s", row.label, row.text), kLength, kHeight);
   html.empty("path", {{"class", "reference"},
                       {"d", format("M%d 0V%d", scale.at(chart.reference), kHeight)}});
   if (isDrawn(row)) {

@@ -4,6 +4,7 @@
 
 #include "base/format.h"
 #include "page/charts.h"
+#include "page/drawing.h"
 
 namespace tavrel::page {
 namespace {
@@ -115,10 +116,7 @@ void writeLineChart(HtmlWriter& html, const LineChart& chart) {
   html.begin("div", {{"class", "line"}});
   html.element("span", range.told == 0 ? "none" : chart.text(range.high), {{"class", "top"}});
   if (range.low != range.high) html.element("span", chart.text(range.low), {{"class", "bottom"}});
-  html.begin("svg", {{"role", "img"},
-                     {"aria-label", nameOf(chart, line)},
-                     {"viewBox", format("0 0 %zu %d", width, kHeight)},
-                     {"preserveAspectRatio", "none"}});
+  beginDrawing(html, nameOf(chart, line), width, kHeight);
   if (const std::string band = bandPath(chart, range); !band.empty())
     html.empty("path", {{"class", "band"}, {"d", band}});
   html.empty("path", {{"d", linePath(chart.values, range)}});

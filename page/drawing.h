@@ -1,0 +1,14 @@
+// What the charts have in common: an SVG image that is stretched to its place.
+#pragma once
+
+#include <cstddef>
+#include <string_view>
+
+#include "page/html_writer.h"
+
+namespace tavrel::page {
+
+/// Begins a drawing of so many units; `HtmlWriter::end` ends it. `name` is its accessible name.
+void beginDrawing(HtmlWriter& html, std::string_view name, std::size_t width, int height);
+
+}  // namespace tavrel::page
