@@ -57,6 +57,12 @@ bool isValidUtf8(std::string_view text) {
   return true;
 }
 
+bool changesDirection(char32_t codePoint) {
+  return codePoint == 0x061C || codePoint == 0x200E || codePoint == 0x200F ||
+         (codePoint >= 0x202A && codePoint <= 0x202E) ||
+         (codePoint >= 0x2066 && codePoint <= 0x2069);
+}
+
 void appendCodePoint(std::string& out, char32_t codePoint) {
   if (codePoint > 0x10FFFF || isSurrogate(codePoint)) codePoint = kReplacementCharacter;
   const auto tail = [&](unsigned shift) {

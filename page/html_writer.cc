@@ -7,12 +7,11 @@ namespace {
 
 // Whether a byte can be copied in texts and in values between quotation marks.
 bool isPlain(char character) {
-  return character >= ' ' && character < 0x7F && character != '<' && character != '>' &&
-         character != '&' && character != '"';
+  return isPrintableAscii(character) && character != '<' && character != '>' && character != '&' &&
+         character != '"';
 }
 
-// Noncharacters, and controls other than line ends and tabs, must not stand in a document. What
-// turns the direction of text could make one name look like another.
+// Noncharacters, and controls other than line ends and tabs, must not stand in a document.
 char32_t shown(char32_t point) {
   constexpr char32_t kControlPictures = 0x2400;
   constexpr char32_t kDeletePicture = 0x2421;
@@ -21,9 +20,8 @@ char32_t shown(char32_t point) {
   if (point == 0x7F) return kDeletePicture;
   const bool isControl = point > 0x7F && point < 0xA0;
   const bool isNoncharacter = (point & 0xFFFE) == 0xFFFE || (point >= 0xFDD0 && point <= 0xFDEF);
-  const bool turnsDirection =
-      (point >= 0x202A && point <= 0x202E) || (point >= 0x2066 && point <= 0x2069);
-  return isControl || isNoncharacter || turnsDirection ? kReplacementCharacter : point;
+  const bool isReplaced = isControl || isNoncharacter || changesDirection(point);
+  return isReplaced ? kReplacementCharacter : point;
 }
 
 void appendEscaped(std::string& out, std::string_view text) {

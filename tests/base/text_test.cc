@@ -48,6 +48,13 @@ TEST(Text, WritesObjectsAsPeopleReadThem) {
   EXPECT_EQ(textOf({}), "(null)");
 }
 
+TEST(Utf8, KnowsWhatChangesTheDirectionOfText) {
+  std::u32string found;
+  for (char32_t codePoint = 0; codePoint <= 0xFFFF; ++codePoint)
+    if (changesDirection(codePoint)) found += codePoint;
+  EXPECT_EQ(found, U"\u061C\u200E\u200F\u202A\u202B\u202C\u202D\u202E\u2066\u2067\u2068\u2069");
+}
+
 TEST(ParseNumber, TakesTextsThatAreNothingElse) {
   EXPECT_EQ(parseNumber<std::int8_t>("-128"), -128);
   EXPECT_EQ(parseNumber<std::uint8_t>("0255"), 255);

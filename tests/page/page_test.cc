@@ -28,7 +28,7 @@ std::string attributes(const HtmlWriter& html, const std::string& name) {
 TEST(HtmlWriterTest, KeepsTextsText) {
   HtmlWriter html;
   html.begin("p", {{"title", "\"><script>'&"}, {"class", ""}});
-  html.text("<b>&amp;\n\t\x01\x7f\xff\u0085\uFFFE\u202E\u2069\u05D0");
+  html.text("<b>&amp;\n\t\x01\x7f\xff\u0085\uFFFE\u061C\u202E\u05D0");
   html.name("a.b..<c");
   html.empty("br");
   html.end();

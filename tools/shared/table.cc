@@ -17,12 +17,10 @@ constexpr std::size_t kNarrowestColumn = 8;
 // Otherwise one long key would push all rows of a listing in a pipe far to the right.
 constexpr std::size_t kWidestPadding = 48;
 
-// Control characters, and marks that change the direction of the text around them.
+// Control characters, separators of lines and paragraphs, and what changes the direction of text.
 bool actsOnTerminal(char32_t codePoint) {
-  return codePoint < 0x20 || (codePoint >= 0x7F && codePoint < 0xA0) ||
-         (codePoint >= 0x200E && codePoint <= 0x200F) ||
-         (codePoint >= 0x2028 && codePoint <= 0x202E) ||
-         (codePoint >= 0x2066 && codePoint <= 0x2069);
+  return codePoint < 0x20 || (codePoint >= 0x7F && codePoint < 0xA0) || codePoint == 0x2028 ||
+         codePoint == 0x2029 || changesDirection(codePoint);
 }
 
 void appendEscape(std::string& out, std::string_view bytes) {
