@@ -31,7 +31,7 @@ std::string signedText(double value) {
 }
 
 /// Probabilities are shown to two digits.
-std::string probabilityText(double value) {
+std::string pValueText(double value) {
   if (value < 1e-300) return "0";
   const double digits = std::pow(10, 1 - std::floor(std::log10(value)));
   return shortNumber(std::round(value * digits) / digits);
@@ -64,7 +64,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
     return one.before.logsWithoutMean + one.after.logsWithoutMean;
   };
   const bool areLeftOut = std::ranges::any_of(answer.comparisons, [&](const Comparison& one) {
-    return (one.isReal() || all) && withoutMean(one) != 0;
+    return (one.isSignificant() || all) && withoutMean(one) != 0;
   });
   using Align = Table::Align;
   std::vector<Table::Column> columns = {{"KEY", Align::Whole},
@@ -80,10 +80,10 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
   if (areLeftOut) columns.push_back({"NO MEAN", Align::Right});
   Table table(std::move(columns));
   for (const Comparison& one : answer.comparisons) {
-    if (one.isReal()) ++changed;
-    if (!one.isReal() && !all) continue;
+    if (one.isSignificant()) ++changed;
+    if (!one.isSignificant() && !all) continue;
     table.add(
-        {{one.key.name, one.isReal() ? Emphasis::Strong : Emphasis::None},
+        {{one.key.name, one.isSignificant() ? Emphasis::Strong : Emphasis::None},
          kindName(one),
          shortNumber(one.before.mean),
          shortNumber(one.after.mean),
@@ -92,7 +92,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
          signedText(one.difference - one.margin) + " to " + signedText(one.difference + one.margin),
          unitOf(one.key.name),
          one.effect ? signedText(std::round(*one.effect * 100) / 100) : "constant",
-         probabilityText(one.corrected),
+         pValueText(one.adjustedPValue),
          withoutMean(one) == 0 ? "" : std::to_string(withoutMean(one))});
   }
   std::ostream& out = context.out();
@@ -122,7 +122,7 @@ Json compareJson(const CompareAnswer& answer) {
     list.push_back({{"key", one.key.name},
                     {"kind", kindName(one)},
                     {"unit", unitOf(one.key.name)},
-                    {"changed", one.isReal()},
+                    {"changed", one.isSignificant()},
                     {"before", sideJson(one.before)},
                     {"after", sideJson(one.after)},
                     {"difference", realJson(one.difference)},
@@ -130,14 +130,14 @@ Json compareJson(const CompareAnswer& answer) {
                     {"upper", realJson(one.difference + one.margin)},
                     {"relative", one.relative ? realJson(*one.relative) : Json(nullptr)},
                     {"effect", one.effect ? realJson(*one.effect) : Json(nullptr)},
-                    {"probability", one.probability},
-                    {"corrected_probability", one.corrected}});
+                    {"probability", one.pValue},
+                    {"corrected_probability", one.adjustedPValue}});
   }
   return {{"old_version", answer.request.oldVersion},
           {"new_version", answer.request.newVersion},
           {"days", daysJson(answer.request.days)},
           {"devices_at_least", answer.devicesAtLeast},
-          {"confidence", kConfidence},
+          {"confidence", kConfidenceLevel},
           {"comparisons", std::move(list)},
           {"left_out",
            {{"not_in_both", answer.missing},
@@ -173,7 +173,7 @@ void printCsv(std::ostream& out, const CompareAnswer& answer) {
   };
   for (const Comparison& one : answer.comparisons) {
     csv.text(one.key.name).title(kindName(one)).title(unitOf(one.key.name));
-    csv.title(one.isReal() ? "true" : "false");
+    csv.title(one.isSignificant() ? "true" : "false");
     csv.integer(one.before.devices).integer(one.after.devices);
     csv.integer(one.before.logs).integer(one.after.logs);
     csv.integer(one.before.logsWithoutMean).integer(one.after.logsWithoutMean);
@@ -183,7 +183,7 @@ void printCsv(std::ostream& out, const CompareAnswer& answer) {
     csv.real(one.difference).real(one.difference - one.margin).real(one.difference + one.margin);
     optional(one.relative);
     optional(one.effect);
-    csv.real(one.probability).real(one.corrected).endRow();
+    csv.real(one.pValue).real(one.adjustedPValue).endRow();
   }
 }
 

@@ -65,7 +65,7 @@ std::size_t logsWithoutMean(const Comparison& one) {
 std::size_t changesOf(const CompareAnswer& comparison) {
   return static_cast<std::size_t>(
       std::count_if(comparison.comparisons.begin(), comparison.comparisons.end(),
-                    [](const Comparison& one) { return one.isReal(); }));
+                    [](const Comparison& one) { return one.isSignificant(); }));
 }
 
 }  // namespace
@@ -124,7 +124,7 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
     html.text(": " + changeText(one));
     html.end();
     html.text(". This is " + strengthText(one) + ". Chance alone would show such a difference in " +
-              chanceText(one.corrected) + " comparisons.");
+              chanceText(one.adjustedPValue) + " comparisons.");
     html.end();
   }
   if (changes > kMostSentences) {
@@ -167,7 +167,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   chart.text = [](double value) { return page::shortNumber(std::round(value * 10) / 10) + " %"; };
   std::size_t unchanged = 0;
   for (const Comparison& one : comparison.comparisons) {
-    if (!one.isReal() && chart.rows.size() >= kMostSentences) {
+    if (!one.isSignificant() && chart.rows.size() >= kMostSentences) {
       ++unchanged;
       continue;
     }
@@ -175,8 +175,8 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     const double scale = 100 / std::abs(one.before.mean);
     chart.rows.push_back({labelOf(comparison, one), (one.difference - one.margin) * scale,
                           one.difference * scale, (one.difference + one.margin) * scale,
-                          one.isReal() ? changeText(one) : "no change beyond chance",
-                          one.isReal()});
+                          one.isSignificant() ? changeText(one) : "no change beyond chance",
+                          one.isSignificant()});
   }
   if (!chart.rows.empty()) writeIntervals(html, chart);
   if (unchanged != 0) {
@@ -193,7 +193,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
                      {"Standard deviations", Align::Number},
                      {"Devices", Align::Number}});
   for (const Comparison& one : comparison.comparisons) {
-    if (!one.isReal()) break;
+    if (!one.isSignificant()) break;
     const std::string_view unit = unitOf(one.key.name);
     table.row();
     table.cell([&](page::HtmlWriter& cell) { cell.name(one.key.name); });
@@ -205,7 +205,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   }
   table.end();
   for (const Comparison& one : comparison.comparisons) {
-    if (!one.isReal() || logsWithoutMean(one) == 0) continue;
+    if (!one.isSignificant() || logsWithoutMean(one) == 0) continue;
     html.begin("p", {{"class", "note"}});
     html.name(one.key.name);
     html.text(" is compared without " +

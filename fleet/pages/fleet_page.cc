@@ -57,7 +57,7 @@ FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
   std::set<std::pair<KeyKind, std::string>> known;
   if (page.comparison) {
     for (const Comparison& one : page.comparison->comparisons) {
-      if (!one.isReal()) break;
+      if (!one.isSignificant()) break;
       known.emplace(one.key.kind, one.key.name);
       add(one.key);
     }

@@ -131,18 +131,18 @@ Comparison comparisonOf(const Key& key, const Measured& before, const Measured& 
   const double squaredError = before.squaredError + after.squaredError;
   if (squaredError == 0) {
     if (result.difference == 0) result.effect = 0;
-    result.probability = result.difference == 0 ? 1 : 0;
+    result.pValue = result.difference == 0 ? 1 : 0;
     return result;
   }
   const auto term = [&](const Measured& one) {
     const double share = one.squaredError / squaredError;
     return share * share / (one.independent - 1);
   };
-  const double freedom = 1 / (term(before) + term(after));
+  const double degreesOfFreedom = 1 / (term(before) + term(after));
   const double error = std::sqrt(squaredError);
   result.effect = result.difference / std::sqrt((before.variance + after.variance) / 2);
-  result.margin = studentQuantile(1 - kConfidence, freedom) * error;
-  result.probability = studentTwoSided(result.difference / error, freedom);
+  result.margin = studentQuantile(1 - kConfidenceLevel, degreesOfFreedom) * error;
+  result.pValue = studentTwoSided(result.difference / error, degreesOfFreedom);
   return result;
 }
 
@@ -255,18 +255,18 @@ class Comparer {
 };
 
 void correctAndSort(std::vector<Comparison>& comparisons) {
-  std::vector<double> probabilities;
+  std::vector<double> pValues;
   for (const Comparison& one : comparisons)
-    probabilities.push_back(one.probability);
-  const std::vector<double> corrected = holm(probabilities);
+    pValues.push_back(one.pValue);
+  const std::vector<double> adjusted = holm(pValues);
   for (std::size_t i = 0; i < comparisons.size(); ++i)
-    comparisons[i].corrected = corrected[i];
+    comparisons[i].adjustedPValue = adjusted[i];
   const auto strength = [](const Comparison& one) {
     return one.effect ? std::abs(*one.effect) : std::numeric_limits<double>::infinity();
   };
   std::stable_sort(comparisons.begin(), comparisons.end(),
                    [&](const Comparison& a, const Comparison& b) {
-                     if (a.isReal() != b.isReal()) return a.isReal();
+                     if (a.isSignificant() != b.isSignificant()) return a.isSignificant();
                      return strength(a) > strength(b);
                    });
 }

@@ -18,7 +18,7 @@
 
 namespace tavrel::fleet {
 
-inline constexpr double kConfidence = 0.95;
+inline constexpr double kConfidenceLevel = 0.95;
 
 struct CompareRequest {
   std::string oldVersion;
@@ -44,12 +44,12 @@ struct Comparison {
   /// side varies but they differ: then it is as strong as can be.
   std::optional<double> effect;
   /// Half the width of the interval around `difference` that covers the true one with probability
-  /// `kConfidence`, for this key by itself.
+  /// `kConfidenceLevel`, for this key by itself.
   double margin = 0;
-  double probability = 0;  ///< of such a difference by chance, for this key by itself
-  double corrected = 0;    ///< the same by Holm's rule, for all keys of the answer
+  double pValue = 0;  ///< probability of such a difference by chance, for this key by itself
+  double adjustedPValue = 0;  ///< the same by Holm's rule, for all keys of the answer
 
-  bool isReal() const { return corrected < 1 - kConfidence; }
+  bool isSignificant() const { return adjustedPValue < 1 - kConfidenceLevel; }
 };
 
 struct CompareAnswer {

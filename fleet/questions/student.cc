@@ -47,17 +47,17 @@ double betaFraction(double a, double b, double x) {
 
 }  // namespace
 
-double studentTwoSided(double t, double freedom) {
+double studentTwoSided(double t, double degreesOfFreedom) {
   if (std::isinf(t)) return 0;
-  // From here on the normal distribution differs by about t^4 / (4 freedom), relatively, and the
-  // fraction below takes ever more steps.
+  // From here on the normal distribution differs by about t^4 / (4 degreesOfFreedom), relatively,
+  // and the fraction below takes ever more steps.
   constexpr double kNormal = 1e8;
-  if (freedom > kNormal) return std::erfc(std::abs(t) / std::numbers::sqrt2);
+  if (degreesOfFreedom > kNormal) return std::erfc(std::abs(t) / std::numbers::sqrt2);
 
-  // The regularised incomplete beta function at x = freedom / (freedom + t²).
-  const double a = freedom / 2;
+  // The regularised incomplete beta function at x = degreesOfFreedom / (degreesOfFreedom + t²).
+  const double a = degreesOfFreedom / 2;
   const double b = 0.5;
-  const double ratio = t * t / freedom;
+  const double ratio = t * t / degreesOfFreedom;
   if (std::isinf(ratio)) return 0;
   const double x = 1 / (1 + ratio);
   const double y = ratio / (1 + ratio);
@@ -68,33 +68,32 @@ double studentTwoSided(double t, double freedom) {
   return std::clamp(1 - front * betaFraction(b, a, y) / b, 0.0, 1.0);
 }
 
-double studentQuantile(double probability, double freedom) {
+double studentQuantile(double probability, double degreesOfFreedom) {
   double low = 0;
   double high = 1;
-  while (studentTwoSided(high, freedom) > probability && std::isfinite(high)) {
+  while (studentTwoSided(high, degreesOfFreedom) > probability && std::isfinite(high)) {
     low = high;
     high *= 2;
   }
   for (double middle = (low + high) / 2; low < middle && middle < high; middle = (low + high) / 2) {
-    (studentTwoSided(middle, freedom) > probability ? low : high) = middle;
+    (studentTwoSided(middle, degreesOfFreedom) > probability ? low : high) = middle;
   }
   return high;
 }
 
-std::vector<double> holm(std::span<const double> probabilities) {
-  std::vector<std::size_t> order(probabilities.size());
+std::vector<double> holm(std::span<const double> pValues) {
+  std::vector<std::size_t> order(pValues.size());
   std::iota(order.begin(), order.end(), std::size_t{0});
-  std::sort(order.begin(), order.end(),
-            [&](auto a, auto b) { return probabilities[a] < probabilities[b]; });
-  std::vector<double> corrected(probabilities.size());
+  std::sort(order.begin(), order.end(), [&](auto a, auto b) { return pValues[a] < pValues[b]; });
+  std::vector<double> adjusted(pValues.size());
   double largest = 0;
   auto left = static_cast<double>(order.size());
   for (const std::size_t index : order) {
-    largest = std::max(largest, std::min(1.0, probabilities[index] * left));
-    corrected[index] = largest;
+    largest = std::max(largest, std::min(1.0, pValues[index] * left));
+    adjusted[index] = largest;
     left -= 1;
   }
-  return corrected;
+  return adjusted;
 }
 
 }  // namespace tavrel::fleet

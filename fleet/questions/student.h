@@ -6,15 +6,15 @@
 
 namespace tavrel::fleet {
 
-/// The probability of a value at least as far from 0 as `t`, on either side. `freedom`, the degrees
-/// of freedom, is positive and need not be whole.
-double studentTwoSided(double t, double freedom);
+/// The probability of a value at least as far from 0 as `t`, on either side. `degreesOfFreedom` is
+/// positive and need not be whole.
+double studentTwoSided(double t, double degreesOfFreedom);
 
 /// The t beyond which, on both sides together, lies `probability` (above 0, below 1).
-double studentQuantile(double probability, double freedom);
+double studentQuantile(double probability, double degreesOfFreedom);
 
-/// Holm's step-down correction: below `a`, with probability 1 - a none of the differences that are
-/// called real is due to chance. In the order of the arguments.
-std::vector<double> holm(std::span<const double> probabilities);
+/// P-values adjusted by Holm's step-down correction: with probability 1 - a none of the differences
+/// whose adjusted value is below `a` is due to chance. In the order of the arguments.
+std::vector<double> holm(std::span<const double> pValues);
 
 }  // namespace tavrel::fleet
