@@ -93,6 +93,16 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
   return chunk;
 }
 
+/* Keeps a chunk that was taken for a lane and is still empty. Of two, one is the spare chunk; the
+ * other has nothing to fold, and so is acknowledged like one that was folded. */
+static void keepEmpty(struct State* state, struct Chunk* chunk) {
+  chunk = atomic_exchange(&state->spareChunk, chunk);
+  if (!chunk) return;
+  const uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
+  atomic_store_explicit(&chunk->acknowledged, generation, memory_order_release);
+  atomic_fetch_add_explicit(&state->reusableChunks, 1, memory_order_relaxed);
+}
+
 static struct Lane* laneOfThread(struct State* state) {
   if (!bhLane) {
     const uint32_t next = atomic_fetch_add_explicit(&state->nextLane, 1, memory_order_relaxed);
@@ -117,7 +127,7 @@ void bhRecordSlowly(struct Key* key, double value) {
     struct Chunk* fresh = takeChunk(process, segment);
     if (!fresh) break;
     if (!atomic_compare_exchange_strong(&lane->chunk, &chunk, fresh)) {
-      atomic_store(&process->state->spareChunk, fresh);
+      keepEmpty(process->state, fresh);
     }
   }
   bhDrop(process, segment);

@@ -39,8 +39,8 @@
  * values in a second pread. While a process may still write, only records before the first empty
  * mark are read; afterwards all. kBHChunkGeneration is 0 while unused and odd while the process
  * empties the chunk. A reader that has folded all records of a generation for good writes the
- * generation to kBHChunkAcknowledged; only then does the process use the chunk again, with a
- * generation that is larger by two.
+ * generation to kBHChunkAcknowledged, as the process does with a chunk that it left empty; only
+ * then does the process use the chunk again, with a generation that is larger by two.
  *
  * A reader that has acknowledged all it could advances kBHHeaderFolds by one: space may be free.
  *

@@ -190,6 +190,11 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   const pid_t child = start([&] {
     const auto isFoldWanted = [&] { return std::filesystem::exists(folder / "fold-wanted"); };
     int i = 0;
+    // Signal handlers, one within the other, record while the second chunk is taken.
+    int handlers = 2;
+    whileFetching = [&] {
+      if (i > kBHChunkRecords && handlers-- > 0) record(i++);
+    };
     while (!isFoldWanted() && i < kRoom)
       record(i++);
     EXPECT_NEAR(i, kRoom * 0.75, 2 * kBHChunkRecords);

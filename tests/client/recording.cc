@@ -8,6 +8,13 @@
 extern "C" {
 int __real_clock_gettime(clockid_t clock, timespec* now);
 int __wrap_clock_gettime(clockid_t clock, timespec* now);
+int __real_madvise(void* from, std::size_t bytes, int advice);
+int __wrap_madvise(void* from, std::size_t bytes, int advice);
+
+int __wrap_madvise(void* from, std::size_t bytes, int advice) {
+  if (tavrel::whileFetching) tavrel::whileFetching();
+  return __real_madvise(from, bytes, advice);
+}
 
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {
   const bool isReal = clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE;
@@ -22,6 +29,8 @@ int __wrap_clock_gettime(clockid_t clock, timespec* now) {
 }
 
 namespace tavrel {
+
+std::function<void()> whileFetching;
 
 TestClock& testClock() {
   static TestClock& clock = shared<TestClock>();

@@ -34,6 +34,9 @@ struct TestClock {
 };
 TestClock& testClock();
 
+/// Called whenever libbrimhold fetches memory.
+extern std::function<void()> whileFetching;
+
 /// Memory whose changes children see.
 template <class T>
 T& shared() {
