@@ -112,13 +112,15 @@ uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key*
   if (number != 0) return number;
   const uint32_t index = (uint32_t)(key - process->state->keys);
   const uint64_t entry = entries[index];
-  char* name = segment->names + offsetOf(entry);
-  if (!bhFetch(name, lengthOf(entry)) ||
+  const char* from = names + offsetOf(entry);
+  _Atomic char* to = segment->names + offsetOf(entry);
+  if (!bhFetch(to, lengthOf(entry)) ||
       !bhFetch(&segment->keys[index], sizeof segment->keys[index])) {
     return 0;
   }
   /* Threads that do this together write the same. */
-  memcpy(name, names + offsetOf(entry), lengthOf(entry));
+  for (uint32_t i = 0; i < lengthOf(entry); ++i)
+    atomic_store_explicit(&to[i], from[i], memory_order_relaxed);
   atomic_store_explicit(&segment->keys[index], entry, memory_order_release);
   atomic_store_explicit(&key->number, index + 1, memory_order_release);
   return index + 1;

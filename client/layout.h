@@ -49,7 +49,7 @@ struct Segment {
   alignas(64) _Atomic uint64_t dropped;
   alignas(64) _Atomic uint64_t folds;
   alignas(4096) _Atomic uint64_t keys[kBHKeys];
-  char names[kBHNamesBytes];
+  _Atomic char names[kBHNamesBytes];
   struct Cell cells[kBHCellCount];
   alignas(4096) struct Chunk chunks[kBHChunkCount];
 };

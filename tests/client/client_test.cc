@@ -1,4 +1,5 @@
 #include <algorithm>
+#include <barrier>
 #include <csignal>
 #include <dlfcn.h>
 #include <random>
@@ -26,6 +27,13 @@ void expectEachOnce(std::vector<double> values, std::uint64_t expected, std::uin
 
 TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   const pid_t child = start([] {
+    keys();
+    // All begin a segment at once, and name their first key in it at once.
+    std::barrier together(kThreads);
+    whileFetching = [&] {
+      thread_local int fetches = 0;
+      if (++fetches <= 2) together.arrive_and_wait();
+    };
     std::vector<std::thread> threads;
     for (int thread = 0; thread < kThreads; ++thread)
       threads.emplace_back([=] {
