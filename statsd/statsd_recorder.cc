@@ -11,8 +11,8 @@ namespace {
 
 constexpr std::size_t kLongestPrefix = 200;
 
-// How often a sampled measurement is recorded at most. A sender must not fill the segment with one
-// line; no client samples more thinly.
+// How often the measurements of a line are recorded at most, unless there are more of them. A
+// sender must not fill the segment with one line; no client samples more thinly.
 constexpr double kMostCopies = 1000;
 
 constexpr const char* kFaultNames[] = {"malformed", "unsupported", "refused", "too_long"};
@@ -81,6 +81,7 @@ void StatsdRecorder::takeLine(std::string_view text) {
 bool StatsdRecorder::record(const StatsdLine& line) {
   Key* const key = find(line.kind == StatsdKind::Series ? series_ : scalars_, line.name);
   if (key == nullptr) return false;
+  const double mostCopies = std::max(1.0, kMostCopies / static_cast<double>(line.values.size()));
   for (const double value : line.values) {
     switch (line.kind) {
       case StatsdKind::Counter:
@@ -94,7 +95,7 @@ bool StatsdRecorder::record(const StatsdLine& line) {
         BHClientScalarSet(key->scalar, takeWhole(value, key->remainder));
         break;
       case StatsdKind::Series: {
-        const double copies = std::min(1 / line.rate, kMostCopies);
+        const double copies = std::min(1 / line.rate, mostCopies);
         for (std::int64_t left = takeWhole(copies, key->remainder); left > 0; --left)
           BHClientDistributionRecord(key->series, value);
         break;

@@ -51,6 +51,11 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
       recorder.take("tenths:0.1|c");
     recorder.take("level:3.9|g\nlevel:7.5|g\nlevel:+0.75|g\nlevel:-2|g");
     recorder.take("time:3.5|ms\ntime:4|h|@0.5\ntime:5|d|@0.00001");
+    recorder.take("time:6:6:6:6|ms|@0.001");
+    std::string many = "time:7";
+    for (int i = 1; i < 1500; ++i)
+      many += ":7";
+    recorder.take(many + "|ms|@0.001");
     recorder.take("time:9|c");  // a scalar may have the name of a series
     recorder.take("bad\nset:1|s\n" + std::string(1023, 'n') + ":1|c");
     recorder.count(StatsdFault::TooLong);
@@ -67,7 +72,9 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
                          {{"s.tavrel-statsd.too_long", kToday}, 1}};
   EXPECT_EQ(scalars, expected);
   std::vector<double> times{3.5, 4, 4};
-  times.insert(times.end(), 1000, 5);
+  times.insert(times.end(), 1000, 5);  // the most of a line
+  times.insert(times.end(), 1000, 6);
+  times.insert(times.end(), 1500, 7);
   EXPECT_EQ(records["s.time"], times);
 }
 
