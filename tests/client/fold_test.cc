@@ -277,6 +277,28 @@ TEST_F(FoldTest, ManyProcessesAndFoldsAtOnceAreExact) {
   EXPECT_TRUE(segments().empty());
 }
 
+TEST_F(FoldTest, WaitsMinutesForAnotherFold) {
+  run([] { add(7); });
+  const std::string path = root / "run/tavrel/fold.lock";
+  Expected<Descriptor> other = FileSystem().lockFile(path);
+  ASSERT_TRUE(other);
+  testClock().monotonic = 1;
+  EXPECT_EQ(
+      foldNow().failure,
+      "cannot lock " + path +
+          ": another process has had it locked for 600 seconds; it is folding: try again later");
+  testClock().monotonic = 1;
+  std::thread end([&] {
+    while (testClock().monotonic < 300)
+      sched_yield();
+    other = Error{};
+  });
+  EXPECT_FALSE(foldNow().failure);
+  end.join();
+  look();
+  EXPECT_EQ(scalar("count"), 7);
+}
+
 TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
   const pid_t child = start([] {
     for (int round = 0; round < 3; ++round) {

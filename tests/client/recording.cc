@@ -19,9 +19,11 @@ int __wrap_madvise(void* from, std::size_t bytes, int advice) {
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {
   const bool isReal = clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE;
   const bool isBoot = clock == CLOCK_BOOTTIME;
-  const std::int64_t seconds = isReal   ? tavrel::testClock().realtime.load()
-                               : isBoot ? tavrel::testClock().boot.load()
-                                        : 0;
+  const bool isSteady = clock == CLOCK_MONOTONIC && tavrel::testClock().monotonic != 0;
+  const std::int64_t seconds = isReal     ? tavrel::testClock().realtime.load()
+                               : isBoot   ? tavrel::testClock().boot.load()
+                               : isSteady ? tavrel::testClock().monotonic += 10
+                                          : 0;
   if (seconds == 0) return __real_clock_gettime(clock, now);
   *now = {seconds, 0};
   return 0;
@@ -60,6 +62,7 @@ Recording::Recording() {
   setenv("TAVREL_ROOT", root.c_str(), 1);
   testClock().realtime = kToday * 86'400 + 3600;
   testClock().boot = 0;
+  testClock().monotonic = 0;
 }
 
 Recording::~Recording() {

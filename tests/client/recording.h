@@ -27,10 +27,12 @@ namespace tavrel {
 
 inline constexpr std::int64_t kToday = 25'000;  // a day after any build
 
-/// The seconds that clock_gettime shows here and in children; 0 leaves a clock alone.
+/// The seconds that clock_gettime shows here and in children; 0 leaves a clock alone. Each look at
+/// the monotonic one takes ten seconds.
 struct TestClock {
   std::atomic<std::int64_t> realtime;
   std::atomic<std::int64_t> boot;
+  std::atomic<std::int64_t> monotonic;
 };
 TestClock& testClock();
 

@@ -281,11 +281,11 @@ Status FileSystem::makePrivateFolder(const std::string& path) {
   return Done{};
 }
 
-Expected<Descriptor> FileSystem::lockFile(const std::string& path) {
+Expected<Descriptor> FileSystem::lockFile(const std::string& path, const LockPatience& patience) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, kLockMode);
   if (descriptor) descriptor = keepFromOthers(*std::move(descriptor), path);
   if (!descriptor) return descriptor;
-  if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
+  if (Status locked = lock(descriptor->get(), path, patience); !locked) return locked.error();
   return descriptor;
 }
 
@@ -327,15 +327,15 @@ Expected<Descriptor> FileSystem::keepFromOthers(Descriptor lock, const std::stri
   return lock;
 }
 
-Status FileSystem::lock(int descriptor, const std::string& path) {
-  const std::int64_t end = monotonicMilliseconds() + limits::kFileLockMilliseconds;
+Status FileSystem::lock(int descriptor, const std::string& path, const LockPatience& patience) {
+  const std::int64_t end = monotonicMilliseconds() + patience.milliseconds;
   while (flock(descriptor, LOCK_EX | LOCK_NB) != 0) {
     if (errno == EINTR) continue;
     if (errno != EWOULDBLOCK) return systemError("lock", path);
     if (monotonicMilliseconds() > end) {
       return Error{"cannot lock " + path + ": another process has had it locked for " +
-                   std::to_string(limits::kFileLockMilliseconds / 1000) +
-                   " seconds; end that process"};
+                   std::to_string(patience.milliseconds / 1000) + " seconds; " +
+                   std::string(patience.advice)};
     }
     constexpr timespec kPause{0, 2'000'000};
     nanosleep(&kPause, nullptr);

@@ -30,6 +30,7 @@
 
 #include "base/bytes.h"
 #include "base/expected.h"
+#include "base/limits.h"
 #include "platform/linux/files/descriptor.h"
 
 namespace tavrel {
@@ -60,6 +61,12 @@ class NewFile {
   std::string temporary_;  // empty once there is nothing to remove
   Descriptor descriptor_;
   bool flushed_ = false;
+};
+
+/// How long to wait for a process that holds a lock, and what to advise when it was too long.
+struct LockPatience {
+  int milliseconds = limits::kFileLockMilliseconds;
+  std::string_view advice = "end that process";
 };
 
 /// A file that grows by whole lines. It is locked until the handle is released, so that whoever
@@ -131,10 +138,10 @@ class FileSystem {
   /// longer commit them.
   void discardTemporaries(const std::string& folder);
 
-  /// Locks the file `path`, made when missing, until the handle is released. Waits for another
-  /// process at most `limits::kFileLockMilliseconds`. Only its owner and root can open it, and so
-  /// nobody else can lock it; of a folder that all may write, only a trusted user's is taken.
-  Expected<Descriptor> lockFile(const std::string& path);
+  /// Locks the file `path`, made when missing, until the handle is released. Only its owner and
+  /// root can open it, and so nobody else can lock it; of a folder that all may write, only a
+  /// trusted user's is taken.
+  Expected<Descriptor> lockFile(const std::string& path, const LockPatience& patience = {});
   /// The same with the file `.lock` of a folder, which must exist.
   Expected<Descriptor> lockFolder(const std::string& folder);
   /// Opens that file without locking it.
@@ -161,7 +168,7 @@ class FileSystem {
   friend class NewFile;
   Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
   Expected<Descriptor> keepFromOthers(Descriptor lock, const std::string& path);
-  Status lock(int descriptor, const std::string& path);
+  Status lock(int descriptor, const std::string& path, const LockPatience& patience = {});
   Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
   Status syncFolderOf(const std::string& path);
   void removeStaleTemporaries(const std::string& folder, const struct stat& fresh);

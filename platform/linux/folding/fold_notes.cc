@@ -12,6 +12,9 @@ namespace {
 
 constexpr std::string_view kLockPath = "/run/tavrel/fold.lock";
 
+// A fold of many values on slow flash takes minutes. The daily run would report without what waits.
+constexpr LockPatience kPatience{600'000, "it is folding: try again later"};
+
 // Lines that are remembered. Those beyond `limits::kFoldRefusalLines` only to count each once.
 // Those that find no room here count in each fold.
 constexpr std::size_t kRemembered = 8192;
@@ -19,7 +22,7 @@ constexpr std::size_t kRemembered = 8192;
 }  // namespace
 
 Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, SystemLog& log) {
-  Expected<Descriptor> file = files.lockFile(root.path(kLockPath));
+  Expected<Descriptor> file = files.lockFile(root.path(kLockPath), kPatience);
   if (!file) return file.error();
   return FoldNotes(*std::move(file), log);
 }

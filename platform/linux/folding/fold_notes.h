@@ -20,8 +20,7 @@ namespace tavrel {
 
 class FoldNotes {
  public:
-  /// Waits for another fold at most `limits::kFileLockMilliseconds`. The log must outlive the
-  /// notes.
+  /// Waits for another fold, for ten minutes at most. The log must outlive the notes.
   static Expected<FoldNotes> lock(const DeviceRoot& root, FileSystem& files, SystemLog& log);
 
   /// Writes a line to the log unless it was told before or is one too many. True when it is new, or
