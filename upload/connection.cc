@@ -4,7 +4,9 @@
 #include <array>
 #include <curl/curl.h>
 #include <new>
+#include <stdexcept>
 
+#include "base/format.h"
 #include "base/limits.h"
 #include "base/version.h"
 
@@ -16,7 +18,13 @@ constexpr long kSlowest = 100;
 
 template <class Argument>
 void set(CURL* handle, CURLoption option, Argument argument) {
-  if (curl_easy_setopt(handle, option, argument) == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
+  const CURLcode code = curl_easy_setopt(handle, option, argument);
+  if (code == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
+  // Among them are the deadlines, and what keeps the connection to TLS.
+  if (code != CURLE_OK) {
+    throw std::runtime_error(format("libcurl refuses option %d: %s", static_cast<int>(option),
+                                    curl_easy_strerror(code)));
+  }
 }
 
 void setText(CURL* handle, CURLoption option, const std::string& text) {
@@ -102,6 +110,8 @@ Connection::Handle Connection::newHandle() const {
 Expected<Answer> Connection::put(const std::string& url, const std::vector<std::string>& headers,
                                  std::string_view body, std::chrono::milliseconds longest,
                                  const GoOn& goOn) {
+  // libcurl takes 0 for no limit.
+  if (longest <= std::chrono::milliseconds(0)) return Error{"no time is left"};
   std::unique_ptr<curl_slist, void (*)(curl_slist*)> list(nullptr, curl_slist_free_all);
   const auto add = [&](const std::string& header) {
     curl_slist* const longer = curl_slist_append(list.get(), header.c_str());

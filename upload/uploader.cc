@@ -171,11 +171,6 @@ Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
     const std::size_t before = sent_ + refused_;
     held_ = 0;
     for (const WaitingLog& log : logs) {
-      if (timeLeft() <= std::chrono::milliseconds(0)) {
-        services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
-                          std::int64_t{configuration_.run.count()});
-        return Outcome::Waits;
-      }
       switch (send(log)) {
         case Step::Next:
           break;
@@ -221,10 +216,16 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   headers.push_back(std::string(kDigestHeader) + ": " + (*packed)->digest);
 
   if (const Step asked = askPermission(**day); asked != Step::Next) return asked;
+  const std::chrono::milliseconds left = timeLeft();
+  if (left <= std::chrono::milliseconds(0)) {
+    services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
+                      std::int64_t{configuration_.run.count()});
+    return Step::Stop;
+  }
   tried_ = true;
   const auto answer =
       connection_->put(configuration_.url + "/" + log.name + ".log", headers, (*packed)->content,
-                       std::min<std::chrono::milliseconds>(configuration_.transfer, timeLeft()),
+                       std::min<std::chrono::milliseconds>(configuration_.transfer, left),
                        [&] { return askPermission(**day) == Step::Next; });
   if (answer) return judge(log, *answer, **packed);
   if (const Step asked = askPermission(**day); asked != Step::Next) return asked;

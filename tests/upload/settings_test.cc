@@ -2,6 +2,7 @@
 #include <netdb.h>
 
 #include "device.h"
+#include "upload/connection.h"
 #include "upload/network.h"
 
 // Stands in for the C library's: the look-up of one name never ends.
@@ -24,6 +25,14 @@ TEST(Upload, HasADeadlineForEverything) {
   ScriptedServer silent([](const std::string&) { return "H"; });
   EXPECT_EQ(device.runAgainst(silent), Outcome::Waits);
   EXPECT_TRUE(device.log.says("Operation too slow. Less than 100 bytes/sec transferred the last "));
+  upload::Connection connection(device.configuration);
+  const auto put = [&](const std::string& url, int milliseconds) {
+    return connection.put(url, {}, "", std::chrono::milliseconds(milliseconds),
+                          [] { return true; });
+  };
+  for (const int milliseconds : {0, -1})
+    EXPECT_EQ(put(silent.url(), milliseconds).error().message, "no time is left");
+  EXPECT_THROW(put(std::string(9'000'000, 'x'), 1000), std::runtime_error) << "libcurl refuses it";
   device.configuration.stall = seconds(60);
   for (auto* const limit : {&device.configuration.transfer, &device.configuration.run}) {
     *limit = seconds(1);
@@ -32,6 +41,10 @@ TEST(Upload, HasADeadlineForEverything) {
     EXPECT_TRUE(device.log.says("Operation timed out after "));
     *limit = seconds(600);
   }
+  device.configuration.run = seconds(0);
+  EXPECT_EQ(device.run(true), Outcome::Waits);
+  EXPECT_EQ(device.log.lines.back(), "logs wait: a run takes at most 0 seconds");
+  device.configuration.run = seconds(600);
   device.configuration.url = "http://hangs.example/logs";
   device.configuration.connect = seconds(1);
   silent.settle();
