@@ -203,13 +203,24 @@ class Answers final : public DeviceCommands {
     asked.push_back(path.substr(path.rfind('/') + 1) + (page == kNvmeSmartLog ? " 02" : " C0"));
     const auto& answer = page == kNvmeSmartLog ? smart : ocp;
     if (!answer) return Error{"NVMe status 0x4002"};
+    if (path.find(killer) != path.npos) throw std::bad_alloc();
     return *answer;
   }
   Expected<Bytes> extCsd(const std::string&) override { return Error{"not permitted"}; }
   Expected<Bytes> ataSmart(const std::string&) override { return Bytes{}; }
 
   std::optional<Bytes> smart = smartPage(), ocp;
+  std::string killer = "none";  // the drive at which the reader ends
   std::vector<std::string> asked;
+};
+
+// Takes readings, which are in memory, but no file on flash.
+class FullFlash final : public FileSystem {
+  int renameFile(const char* from, const char* to) override {
+    if (!std::string_view(to).ends_with(kMemoryFile)) return FileSystem::renameFile(from, to);
+    errno = ENOSPC;
+    return -1;
+  }
 };
 
 class HealthReaderTest : public testing::Test, protected TemporaryRoot {
@@ -230,6 +241,12 @@ class HealthReaderTest : public testing::Test, protected TemporaryRoot {
     for (Reading& reading : loadReadings(root, files).readings)
       byName.emplace(reading.name, reading);
     return byName;
+  }
+
+  /// As the daily run of a day leaves its state.
+  void run(std::int64_t day) const {
+    write("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist",
+          *plist::writeXml(plist::Dictionary{{std::string(kLastRunDayKey), day}}));
   }
 
   FileSystem files;
@@ -280,10 +297,6 @@ TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
 
 TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
   addNvme("nvme0", "S1");
-  const auto run = [&](std::int64_t day) {
-    write("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist",
-          *plist::writeXml(plist::Dictionary{{std::string(kLastRunDayKey), day}}));
-  };
   run(1);
   ASSERT_TRUE(readAll(1000));
   run(2);
@@ -309,6 +322,28 @@ TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
   std::filesystem::remove(root.path("/sys/class/nvme/nvme0"));
   ASSERT_TRUE(readAll(6000));
   EXPECT_TRUE(readings().empty());
+}
+
+TEST_F(HealthReaderTest, AKilledReaderTellsNoGrowthTwice) {
+  addNvme("nvme0", "S1");
+  addNvme("nvme1", "S2");
+  run(1);
+  ASSERT_TRUE(readAll(1000));
+  answers.killer = "nvme1";
+  for (const unsigned day : {2U, 3U, 4U}) {
+    run(day);
+    put(*answers.smart, 48, {day + 1});
+    EXPECT_THROW(readAll(day * 1000), std::bad_alloc);
+    EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000) << day;
+  }
+  answers.killer = "none";
+  run(5);
+  FullFlash full;
+  EXPECT_FALSE(HealthReader(root, full, answers, log).readAll(5000));
+  EXPECT_EQ(readings()["nvme1"].time, 5000);
+  EXPECT_TRUE(readings()["nvme1"].growth.empty()) << "it could not be remembered";
+  ASSERT_TRUE(readAll(6000));
+  EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 3 * 512'000);
 }
 
 TEST(HealthTest, Verdicts) {

@@ -71,10 +71,10 @@ Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& mo
   return growth;
 }
 
-void Memory::forgetOld(std::int64_t now) {
-  std::erase_if(drives, [now](const auto& drive) {
-    return drive.second.seen < now - limits::kDriveMemorySeconds;
-  });
+bool Memory::forgetOld(std::int64_t now) {
+  return std::erase_if(drives, [now](const auto& drive) {
+           return drive.second.seen < now - limits::kDriveMemorySeconds;
+         }) > 0;
 }
 
 Expected<std::string> encodeMemory(const Memory& memory) {

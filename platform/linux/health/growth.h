@@ -45,8 +45,9 @@ struct Memory {
   std::map<std::string, DriveMemory, std::less<>> drives;  // by identity
   std::map<std::string, bool, std::less<>> hasOcpLog;      // by model and firmware
 
-  /// Drops drives that were last seen more than `limits::kDriveMemorySeconds` before.
-  void forgetOld(std::int64_t now);
+  /// Drops drives that were last seen more than `limits::kDriveMemorySeconds` before. Says whether
+  /// there were any.
+  bool forgetOld(std::int64_t now);
 };
 
 Expected<std::string> encodeMemory(const Memory& memory);

@@ -146,6 +146,14 @@ bool HealthReader::write(const Reading& reading) {
   return static_cast<bool>(written);
 }
 
+bool HealthReader::keep(const Memory& memory) {
+  const auto document = encodeMemory(memory);
+  const Status kept = document ? files_.replace(root_.path(kMemoryFile), asBytes(*document), 0600)
+                               : Status(document.error());
+  if (!kept) log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
+  return static_cast<bool>(kept);
+}
+
 bool HealthReader::removeGone(const std::vector<Drive>& drives) {
   const std::string folder = root_.path(kReadingsFolder);
   const auto names = files_.list(folder);
@@ -173,16 +181,18 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
       log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
     } else {
       reading.growth = takeGrowth(memory.drives[identityOf(drive)], reading.figures, moment);
+      // Kept before anybody sees the growth, which the next run would have again otherwise: the
+      // next drive may be one that never answers.
+      if (!keep(memory)) {
+        reading.growth.clear();
+        isDone = false;
+      }
     }
     isDone = write(reading) && isDone;
   }
-  isDone = removeGone(drives) && isDone;
-  memory.forgetOld(moment.seconds);
-  const auto document = encodeMemory(memory);
-  const Status kept = document ? files_.replace(root_.path(kMemoryFile), asBytes(*document), 0600)
-                               : Status(document.error());
-  if (!kept) log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
-  return isDone && kept;
+  // Last, because a drive that was read is not old, whatever the clock showed before.
+  if (memory.forgetOld(moment.seconds)) isDone = keep(memory) && isDone;
+  return removeGone(drives) && isDone;
 }
 
 }  // namespace tavrel::health

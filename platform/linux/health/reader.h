@@ -38,6 +38,7 @@ class HealthReader {
   Reading readDrive(const Drive& drive, Memory& memory, bool& isAsleep);
   void readNvme(const Drive& drive, Memory& memory, Reading& reading);
   bool write(const Reading& reading);
+  bool keep(const Memory& memory);
   bool removeGone(const std::vector<Drive>& drives);
 
   const DeviceRoot& root_;
