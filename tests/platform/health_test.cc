@@ -8,6 +8,7 @@
 #include "platform/linux/health/reader.h"
 #include "platform/linux/health/verdict.h"
 #include "platform/persisted_state.h"
+#include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
 #include "temporary_root.h"
 
@@ -195,6 +196,11 @@ TEST(HealthTest, Growth) {
       memory = *decodeMemory(asBytes(*encodeMemory(memory)));
     }
   }
+  Memory damaged;
+  damaged.drives["d"].isCounting = true;
+  damaged.drives["d"].last["written"] = INT64_MIN;
+  damaged = *decodeMemory(asBytes(*encodeMemory(damaged)));
+  EXPECT_EQ(valuesOf(takeGrowth(damaged.drives["d"], {{written, 5}}, {1000, "a", 1})), Values{});
 }
 
 class Answers final : public DeviceCommands {
@@ -384,6 +390,12 @@ TEST(HealthTest, Verdicts) {
     EXPECT_EQ(judge(reading, 1000, "b").problems, each.problems | kOld);
     EXPECT_EQ(judge(reading, 1001 + 2 * 86'400, "a").problems, each.problems | kOld);
   }
+  const auto document =
+      plist::writeBinary(plist::Dictionary{{"version", 1},
+                                           {"name", "d"},
+                                           {"kind", nameOf(DriveKind::Nvme)},
+                                           {"time", plist::Date::since1970(-1e300)}});
+  EXPECT_EQ(judge(*decodeReading(asBytes(*document)), 1'800'000'000, "").problems, kOld);
 }
 
 }  // namespace

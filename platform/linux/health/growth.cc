@@ -32,7 +32,8 @@ plist::Dictionary encode(const Counters& counters) {
 Counters decodeCounters(const plist::Dictionary& dictionary) {
   Counters counters;
   for (const plist::Entry& entry : dictionary) {
-    if (const auto number = entry.value.number()) {
+    const auto number = entry.value.number();
+    if (number && number->int64() >= 0) {
       counters.emplace(std::string(entry.key.view()), number->int64());
     }
   }
