@@ -149,6 +149,37 @@ TEST_F(FoldTest, AKillAtAnySystemCallLosesAndRepeatsNothing) {
   EXPECT_EQ(foldNow().removed, 1U);
 }
 
+TEST_F(FoldTest, ASegmentThatBeginsDuringAFoldIsTakenOnce) {
+  run([] { add(1); });
+  const auto model = root / "model";
+  std::filesystem::rename(segments().at(0), model);
+  const auto path = folder / "new.segment";
+  int total = 0;
+  for (std::uint64_t calls = 0;; calls += 3) {
+    SCOPED_TRACE(calls);
+    std::filesystem::copy_file(model, path, std::filesystem::copy_options::overwrite_existing);
+    const Descriptor file(open(path.c_str(), O_RDWR | O_CLOEXEC));
+    const auto write = [&](std::uint64_t offset, std::span<const std::uint64_t> words) {
+      const auto size = std::ssize(std::as_bytes(words));
+      EXPECT_EQ(pwrite(file.get(), words.data(), words.size_bytes(), static_cast<off_t>(offset)),
+                size);
+    };
+    write(kBHHeaderMagic, {{0}});
+    write(kBHHeaderIdentity, {{0, 0}});
+    const bool isStopped = runUntilSystemCall(
+        calls, [&] { foldNow(); },
+        [&] {
+          write(kBHHeaderIdentity, {{calls, 1}});
+          write(kBHHeaderMagic, {{kBHSegmentMagic}});
+        });
+    if (!isStopped) break;
+    ASSERT_FALSE(foldNow().failure);
+    look();
+    ASSERT_EQ(scalar("count"), ++total);
+  }
+  EXPECT_GT(total, 30);
+}
+
 TEST_F(FoldTest, AKilledProgramLosesAndRepeatsNothing) {
   auto& progress = shared<std::atomic<int>>();
   std::mt19937 random(7);

@@ -23,9 +23,11 @@ inline int forkProcess(const std::function<void()>& body,
   ::_exit(0);
 }
 
-/// Runs `body` in a forked process that is killed before its system call number `calls`. False when
-/// it ended before that.
-inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& body) {
+/// Runs `body` in a forked process that is killed before its system call number `calls`. With
+/// `meanwhile`, it is not: it waits there for that and then goes on to its end. False when it ended
+/// before that call.
+inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& body,
+                               const std::function<void()>& meanwhile = {}) {
   const int child = forkProcess([&] {
     ::ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
     ::raise(SIGSTOP);
@@ -39,7 +41,12 @@ inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& b
     ::waitpid(child, &status, 0);
     if (WIFEXITED(status) || WIFSIGNALED(status)) return false;
   }
-  ::kill(child, SIGKILL);
+  if (meanwhile) {
+    meanwhile();
+    ::ptrace(PTRACE_DETACH, child, nullptr, nullptr);
+  } else {
+    ::kill(child, SIGKILL);
+  }
   ::waitpid(child, &status, 0);
   return true;
 }

@@ -148,9 +148,9 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   OpenSegment& segment = *opening->segment;
   const std::uint32_t owner = segment.entry.owner;
   SegmentReader reader(segment.file.get());
-  const SegmentFacts facts = reader.facts();
   // Asked first: what is read after the last writer has gone is all that there is.
-  const bool isWriterGone = findSegmentWriter(segment.file.get(), facts) == SegmentWriter::Gone;
+  const bool isWriterGone =
+      findSegmentWriter(segment.file.get(), reader.facts()) == SegmentWriter::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state) {
@@ -161,7 +161,8 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     if (isWriterGone) folded_.push_back({{}, std::move(segment), {}, true});
     return Done{};
   }
-  const SegmentName name{owner, facts.identity};
+  // Before, its process may not have written them yet.
+  const SegmentName name{owner, reader.facts().identity};
   if (!found_.insert(name).second) {
     refuse(folder_.refusal(entry.name, "a copy of another segment"));
     return Done{};

@@ -65,15 +65,14 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
                           SqliteHistory* history, const RowSelection& selection, FoldedRows& rows,
                           PendingDistributions& buffer) {
   SegmentReader reader(segment.file.get());
-  const SegmentFacts facts = reader.facts();
   // A lease could be in the way of a fold.
-  const bool isWriterGone = findSegmentProcess(facts) == SegmentWriter::Gone;
+  const bool isWriterGone = findSegmentProcess(reader.facts()) == SegmentWriter::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state || *state != SegmentReader::State::Begun) return Done{};
   SegmentPosition position;
   if (history != nullptr && history->hasStore()) {
-    const auto stored = history->segmentPosition(segment.entry.owner, facts.identity);
+    const auto stored = history->segmentPosition(segment.entry.owner, reader.facts().identity);
     if (!stored) return stored.error();
     if (*stored) {
       auto decoded = SegmentPosition::decode(**stored);

@@ -83,6 +83,7 @@ class SegmentReader {
 
   /// An error for a file that is not a segment of this version: foreign type, size or magic.
   Expected<State> state() const;
+  /// All there when they are read after `state` has said that the segment is begun.
   SegmentFacts facts() const { return file_.facts(); }
 
   /// Fails when something that was looked at so far could not be read: it is not to be used then.
