@@ -13,6 +13,7 @@
 #include <thread>
 
 #include "base/bytes.h"
+#include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_fold.h"
@@ -577,6 +578,51 @@ TEST_F(FoldTest, AStoreThatTakesNothingLetsSegmentsWait) {
   look();
   EXPECT_EQ(scalar("count"), 1);
   EXPECT_TRUE(segments().empty());
+}
+
+TEST_F(FoldTest, AStoreDamagedWhereOnlyFoldsLookIsSetAside) {
+  const auto connection = [&] {
+    return openStoreForWriting(store(), std::make_shared<BusyBudget>(1000));
+  };
+  for (const char* damaged : {"segments", "list of free pages"}) {
+    SCOPED_TRACE(damaged);
+    std::filesystem::remove_all(store().parent_path());
+    run([] { add(1); });
+    ASSERT_FALSE(foldNow().failure);
+    auto open = connection();
+    open.execute("CREATE TABLE t (b); INSERT INTO t VALUES (zeroblob(99999)); DROP TABLE t");
+    ASSERT_TRUE(open.checkpoint());
+    std::fstream file(store());
+    std::int64_t page =
+        open.integer(format("SELECT rootpage FROM sqlite_schema WHERE name = '%s'", damaged));
+    if (page == 0) {
+      file.seekg(34);  // the lower half of its first page
+      page = file.get() * 256 + file.get();
+    }
+    ASSERT_GT(page, 1);
+    file.seekp((page - 1) * 4096) << std::string(4096, '\xff');
+    file.close();
+    run([] {
+      add(2);
+      for (int i = 0; i < 2000; ++i)
+        record(i);
+    });
+    std::ofstream(folder / damaged) << "no segment";
+    const FoldReport report = foldNow();
+    EXPECT_FALSE(report.failure) << *report.failure;
+    EXPECT_EQ(report.segmentsRefused, 1U);
+    EXPECT_EQ(std::ranges::count_if(log.lines,
+                                    [](const std::string& line) {
+                                      return line.find(" and a new store begins") !=
+                                             std::string::npos;
+                                    }),
+              1);
+    look();
+    EXPECT_EQ(scalar("count"), 2);
+    EXPECT_EQ(figure("segments_refused"), 1);
+    expectEachOnce(2000);
+    EXPECT_TRUE(segments().empty());
+  }
 }
 
 TEST_F(FoldTest, ARowThatTakesNothingRefusesItsValuesAlone) {

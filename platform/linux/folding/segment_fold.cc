@@ -36,11 +36,17 @@ struct FoldedSegment {
 
 class FoldRun {
  public:
+  /// `refusedEarlier`: segments that notes tell of and no store has counted.
   FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
-          const Recorders& recorders, FoldReport& report)
-      : folder_(folder), store_(store), notes_(notes), recorders_(recorders), report_(report) {}
+          const Recorders& recorders, FoldReport& report, std::uint64_t refusedEarlier)
+      : folder_(folder), store_(store), notes_(notes), recorders_(recorders), report_(report) {
+    counts_.segmentsRefused = refusedEarlier;
+  }
 
   Status run(const SegmentFolder::Listing& listing);
+  /// Whether the run failed on a damaged store, which is now set aside.
+  bool hasReplacedStore() const { return hasReplacedStore_; }
+  std::uint64_t refusedSegments() const { return counts_.segmentsRefused; }
 
  private:
   Status fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing);
@@ -68,6 +74,7 @@ class FoldRun {
   std::map<std::uint32_t, std::uint64_t> values_;
   std::set<std::uint32_t> toldUsers_;
   std::size_t next_ = 0;  // in the listing
+  bool hasReplacedStore_ = false;
 
   // Of the current transaction.
   FoldReport counts_;
@@ -85,13 +92,17 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
     refuse(line);
   if (listing.segments.empty() && counts_.segmentsRefused == 0) return Done{};
   do {
-    const auto batch = store_.beginBatch(Sharing::Avoided);
+    auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
     // One damaged row must not keep all that programs recorded from the store.
     (*batch)->refuseUnwritableSeries();
     Status done = fillBatch(**batch, listing);
     if (done) done = (*batch)->commit();
-    if (!done) return done;
+    if (!done) {
+      Status replaced = store_.replaceDamaged(*std::move(batch), done.error());
+      hasReplacedStore_ = static_cast<bool>(replaced);
+      return replaced;
+    }
     finishSegments();
   } while (next_ < listing.segments.size() || !removed_.empty());
   return Done{};
@@ -278,6 +289,17 @@ void FoldRun::finishSegments() {
   counts_ = {};
 }
 
+Status foldAll(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
+               const Recorders& recorders, FoldReport& report,
+               const SegmentFolder::Listing& listing) {
+  FoldRun fold(folder, store, notes, recorders, report, 0);
+  Status done = fold.run(listing);
+  if (!fold.hasReplacedStore()) return done;
+  // The new store knows no positions, and what earlier transactions took is lost with the other.
+  report.waiting = 0;
+  return FoldRun(folder, store, notes, recorders, report, fold.refusedSegments()).run(listing);
+}
+
 }  // namespace
 
 FoldReport SegmentFold::run() {
@@ -302,8 +324,7 @@ FoldReport SegmentFold::run() {
     report.failure = listing.error().message;
   } else if (!listing->segments.empty() || !listing->refusals.empty()) {
     const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
-    if (const Status done = FoldRun(**folder, store_, *notes, recorders, report).run(*listing);
-        !done) {
+    if (const Status done = foldAll(**folder, store_, *notes, recorders, report, *listing); !done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
     }
   }

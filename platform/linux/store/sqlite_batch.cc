@@ -37,8 +37,9 @@ struct SqliteBatch::Statements {
   DistributionWriter distributions;
 };
 
-SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site)
-    : connection_(std::move(connection)), site_(site), kept_(site.path) {
+SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site,
+                         std::optional<FileIdentity> file)
+    : connection_(std::move(connection)), site_(site), file_(file), kept_(site.path) {
   // Rows are written in the order of their keys, so that few pages are changed again and again.
   connection_.execute("PRAGMA cache_size = -2048");
 }
@@ -97,7 +98,8 @@ void SqliteBatch::removeTakenValues() {
 // Closing the connection rolls an unfinished transaction back.
 SqliteBatch::~SqliteBatch() = default;
 
-Error SqliteBatch::describe(const StoreFailure& failure) const {
+Error SqliteBatch::fail(const StoreFailure& failure) {
+  if (failure.fault == StoreFault::Damaged) damage_ = {file_, failure};
   return Error{site_.describe(failure)};
 }
 
@@ -138,7 +140,7 @@ Status SqliteBatch::setScalar(std::int32_t day, std::string_view key, std::int64
   try {
     putScalar(day, key, value);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -160,7 +162,7 @@ Expected<std::optional<std::int64_t>> SqliteBatch::scalar(std::int32_t day, std:
   try {
     return readScalar(day, key);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
 }
 
@@ -174,7 +176,7 @@ Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64
     }
     writeScalar(day, key, sum);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -198,7 +200,7 @@ Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
       samples = samples.subspan(taken.size());
     }
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -207,7 +209,7 @@ Status SqliteBatch::limitWaiting() {
   try {
     if (distributions_.bytes() >= kPendingBytes) writeDistributions();
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -218,7 +220,7 @@ Expected<std::optional<std::string>> SqliteBatch::segmentPosition(std::uint32_t 
     begin();
     return segment_table::position(connection_, owner, identity);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
 }
 
@@ -227,7 +229,7 @@ Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
     begin();
     return segment_table::names(connection_);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
 }
 
@@ -237,7 +239,7 @@ Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity iden
     begin();
     segment_table::setPosition(connection_, owner, identity, position);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -247,7 +249,7 @@ Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity i
     begin();
     segment_table::removePosition(connection_, owner, identity);
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }
@@ -278,7 +280,7 @@ Expected<std::uint64_t> SqliteBatch::refusedValues() {
   try {
     writeDistributions();
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return refused_;
 }
@@ -314,7 +316,7 @@ Status SqliteBatch::commit() {
   try {
     finish();
   } catch (const StoreFailure& failure) {
-    return describe(failure);
+    return fail(failure);
   }
   return Done{};
 }

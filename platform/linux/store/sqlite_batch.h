@@ -33,8 +33,9 @@ namespace tavrel {
 
 class SqliteBatch {
  public:
-  /// Throws `StoreFailure`.
-  SqliteBatch(SqliteConnection connection, const StoreSite& site);
+  /// `file` is the store's file, when it was there before the connection. Throws `StoreFailure`.
+  SqliteBatch(SqliteConnection connection, const StoreSite& site,
+              std::optional<FileIdentity> file = std::nullopt);
   ~SqliteBatch();
   SqliteBatch(const SqliteBatch&) = delete;
   SqliteBatch& operator=(const SqliteBatch&) = delete;
@@ -75,6 +76,13 @@ class SqliteBatch {
   /// Keeps the changes and ends the batch.
   Status commit();
 
+  /// The damage of the store that has made an operation fail, with the file in which it is.
+  struct Damage {
+    std::optional<FileIdentity> file;
+    StoreFailure failure;
+  };
+  const std::optional<Damage>& damage() const { return damage_; }
+
   /// Makes other writers wait, gives the store the present schema and takes kept values in; for use
   /// inside the store, as what follows: they throw `StoreFailure`.
   void begin();
@@ -103,10 +111,12 @@ class SqliteBatch {
   std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
-  Error describe(const StoreFailure& failure) const;
+  Error fail(const StoreFailure& failure);
 
   SqliteConnection connection_;
   StoreSite site_;
+  const std::optional<FileIdentity> file_;
+  std::optional<Damage> damage_;
   KeptValues kept_;
   std::optional<std::uint32_t> takenNumber_;  // of the last kept values in this transaction
   std::unique_ptr<Statements> statements_;

@@ -200,10 +200,21 @@ Expected<std::unique_ptr<SqliteHistory>> SqliteStore::openHistory() {
 
 Expected<std::unique_ptr<SqliteBatch>> SqliteStore::beginBatch(Sharing sharing) {
   std::unique_ptr<SqliteBatch> batch;
-  const auto failure = attempt(
-      [&](const auto&) { batch = std::make_unique<SqliteBatch>(openForWriting(sharing), site_); });
+  const auto failure = attempt([&](const auto& identity) {
+    batch = std::make_unique<SqliteBatch>(openForWriting(sharing), site_, identity);
+  });
   if (failure) return Error{site_.describe(*failure)};
   return batch;
+}
+
+Status SqliteStore::replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Error& error) {
+  const auto damage = batch->damage();
+  batch.reset();
+  if (!damage) return error;
+  if (const auto obstacle = site_.setAside(damage->file, damage->failure)) {
+    return Error{site_.describe(*obstacle)};
+  }
+  return Done{};
 }
 
 Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {

@@ -62,6 +62,10 @@ class SqliteStore : public StatisticsStore {
   /// A transaction of many changes; the store is created when there is none.
   Expected<std::unique_ptr<SqliteBatch>> beginBatch(Sharing sharing = Sharing::WithReaders);
 
+  /// Gives a batch up that has failed with `error`. Done when the store was damaged and has been
+  /// set aside: the next batch fills a new one. Otherwise the error, with what was in the way.
+  Status replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Error& error);
+
   /// To remove days; null when there is no store.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
 
