@@ -223,6 +223,35 @@ TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
   EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{"2"});
 }
 
+TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {
+  setLastRun(kToday - 1);
+  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  const std::string where = "statistics store " + store.path() + ": ";
+  for (const bool areScalars : {true, false}) {
+    auto batch = store.beginBatch();
+    for (int i = 0; i < (areScalars ? 5000 : 5); ++i) {
+      const std::string key = format("com.example.%04d", i);
+      ASSERT_TRUE(areScalars ? (*batch)->setScalar(kToday - 2, key, i)
+                             : (*batch)->appendValue(kToday - 2, key, 1, i));
+    }
+    ASSERT_TRUE((*batch)->setScalar(kToday, "com.example.today", 1));
+    ASSERT_TRUE((*batch)->commit());
+    sql("PRAGMA wal_checkpoint(TRUNCATE)");
+    std::string content = contentOf(store.path());
+    content.at(content.find("com.example.0000") + 12) ^= 8;  // the first key of the day
+    std::ofstream(store.path()) << content;
+    EXPECT_EQ(tidy().failures,
+              Lines{where + "its rows are not in the order of their keys: restore the "
+                            "file from a copy or move it away"});
+    const auto erased = store.erase({.prefix = "com.example."});
+    ASSERT_FALSE(erased);
+    EXPECT_EQ(erased.error().message, where +
+                                          "it was damaged and is set aside with what was to be "
+                                          "erased: remove that file");
+    EXPECT_EQ(store.erase({.prefix = "com.example."})->scalars, 0U);
+  }
+}
+
 TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   const auto fileLog = [&](const std::string& name, std::size_t bytes) {
     write(kPending + name + ".log", std::string(bytes, 'L'));

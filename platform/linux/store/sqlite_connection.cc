@@ -266,6 +266,14 @@ void SqliteStatement::run() {
   reset();
 }
 
+void SqliteStatement::runOnFound() {
+  run();
+  if (sqlite().changes(sqlite().db_handle(handle_)) > 0) return;
+  throw StoreFailure{StoreFault::Damaged,
+                     "its rows are not in the order of their keys: restore the file from a copy or "
+                     "move it away"};
+}
+
 bool SqliteStatement::isNull(int column) const {
   return sqlite().column_type(handle_, column) == SQLITE_NULL;
 }

@@ -115,6 +115,9 @@ class SqliteStatement {
   void reset();
   /// Runs to the end and makes the statement ready to run again.
   void run();
+  /// As `run`, for a change of rows that were found in the same transaction: the store is damaged
+  /// when it finds none of them.
+  void runOnFound();
 
   bool isNull(int column) const;
   std::int64_t integer(int column) const;

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <optional>
 #include <utility>
+#include <vector>
 
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/store/chunk_runs.h"
@@ -103,19 +104,18 @@ ErasedRows StoreErasure::eraseRows(const RowRange& range) {
 void StoreErasure::eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased) {
   auto day = nextDay(connection_, table, range.firstDay);
   while (day && *day <= range.lastDay) {
-    const auto keys = nextKeys(connection_, table, *day, range.prefix);
-    if (keys.empty()) {
+    if (!eraseSome(table, *day, range.prefix, erased)) {
       day = nextDay(connection_, table, *day + 1);
-    } else {
-      eraseKeys(table, *day, keys, erased);
     }
   }
 }
 
-void StoreErasure::eraseKeys(std::string_view table, std::int64_t day,
-                             const std::vector<std::string>& keys, ErasedRows& erased) {
+// False when the day has no more such rows.
+bool StoreErasure::eraseSome(std::string_view table, std::int64_t day, const std::string& prefix,
+                             ErasedRows& erased) {
   ErasedRows sum = erased;
   connection_.execute("BEGIN IMMEDIATE");
+  const auto keys = nextKeys(connection_, table, day, prefix);
   {
     SqliteStatement removeRow(connection_,
                               statement("DELETE FROM ", table, " WHERE day = ?1 AND key = ?2"));
@@ -129,7 +129,6 @@ void StoreErasure::eraseKeys(std::string_view table, std::int64_t day,
       if (table == "distributions") {
         row.bind(1, day);
         row.bind(2, std::string_view(key));
-        // Another process may have removed it since.
         const bool isThere = row.step();
         const auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
         sum.distributions += isThere ? 1U : 0U;
@@ -148,12 +147,13 @@ void StoreErasure::eraseKeys(std::string_view table, std::int64_t day,
       }
       removeRow.bind(1, day);
       removeRow.bind(2, std::string_view(key));
-      removeRow.run();
+      removeRow.runOnFound();
     }
   }
   connection_.execute("COMMIT");
   erased = sum;
   limitLog();
+  return !keys.empty();
 }
 
 void StoreErasure::eraseStrayChunks() {

@@ -13,7 +13,6 @@
 #include <limits>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "platform/linux/store/sqlite_connection.h"
 
@@ -60,7 +59,7 @@ class StoreErasure {
 
  private:
   void eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased);
-  void eraseKeys(std::string_view table, std::int64_t day, const std::vector<std::string>& keys,
+  bool eraseSome(std::string_view table, std::int64_t day, const std::string& prefix,
                  ErasedRows& erased);
   void limitLog();
 

@@ -49,6 +49,7 @@ SqliteLibrary load() {
   find(library, "sqlite3_bind_blob64", functions.bind_blob64);
   find(library, "sqlite3_bind_null", functions.bind_null);
   find(library, "sqlite3_step", functions.step);
+  find(library, "sqlite3_changes", functions.changes);
   find(library, "sqlite3_reset", functions.reset);
   find(library, "sqlite3_column_type", functions.column_type);
   find(library, "sqlite3_column_int64", functions.column_int64);

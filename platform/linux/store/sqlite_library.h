@@ -29,6 +29,7 @@ struct SqliteLibrary {
   decltype(&sqlite3_bind_blob64) bind_blob64;
   decltype(&sqlite3_bind_null) bind_null;
   decltype(&sqlite3_step) step;
+  decltype(&sqlite3_changes) changes;
   decltype(&sqlite3_reset) reset;
   decltype(&sqlite3_column_type) column_type;
   decltype(&sqlite3_column_int64) column_int64;

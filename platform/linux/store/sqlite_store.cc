@@ -155,7 +155,13 @@ void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
 
 Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
   ErasedRows erased;
+  bool isSetAside = false;
   const auto failure = attempt([&](const auto& identity) {
+    if (std::exchange(isSetAside, true) && range != RowRange()) {
+      throw StoreFailure{StoreFault::Other,
+                         "it was damaged and is set aside with what was to be erased: remove that "
+                         "file"};
+    }
     if (!identity && !KeptValues(site_.path).exist()) return;
     SqliteBatch batch(openForWriting(Sharing::WithReaders), site_);
     batch.begin();

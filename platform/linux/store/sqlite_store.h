@@ -73,7 +73,8 @@ class SqliteStore : public StatisticsStore {
   Expected<std::unique_ptr<SqliteHistory>> openHistory();
 
   /// Removes rows, also those that are kept beside the store, and overwrites what they held. After
-  /// a failure some may be gone.
+  /// a failure some may be gone. What a damaged store holds is set aside with it; unless everything
+  /// was to go, that is a failure.
   Expected<ErasedRows> erase(const RowRange& range);
 
  private:

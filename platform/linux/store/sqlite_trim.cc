@@ -145,7 +145,7 @@ std::int64_t SqliteTrim::removeScalars(std::int32_t day, std::int64_t budget) {
     SqliteStatement remove(connection_, "DELETE FROM scalars WHERE day = ?1 AND key <= ?2");
     remove.bind(1, day);
     remove.bind(2, std::string_view(key));
-    remove.run();
+    remove.runOnFound();
     return budget;
   }
   last.reset();
@@ -194,7 +194,7 @@ bool SqliteTrim::removeRow(std::int32_t day, Row& row, std::int64_t& budget) {
     SqliteStatement remove(connection_, "DELETE FROM distributions WHERE day = ?1 AND key = ?2");
     remove.bind(1, day);
     remove.bind(2, std::string_view(row.key));
-    remove.run();
+    remove.runOnFound();
     --budget;
     return true;
   }
@@ -207,7 +207,7 @@ bool SqliteTrim::removeRow(std::int32_t day, Row& row, std::int64_t& budget) {
   shorten.bind(2, std::string_view(row.key));
   shorten.bind(3, row.count);
   shorten.bind(4, std::string_view(packed));
-  shorten.run();
+  shorten.runOnFound();
   return false;
 }
 
