@@ -76,9 +76,17 @@ void StoreErasure::limitLog() {
     connection_.checkpoint(false, SqliteConnection::LogFile::CutOff);
 }
 
+bool StoreErasure::hasLeftPages(SqliteConnection& connection) {
+  return connection.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'erased'") > 0;
+}
+
+void StoreErasure::dropPages(SqliteConnection& connection) {
+  connection.execute("DROP TABLE IF EXISTS erased");
+}
+
 // Rows of zeros take the free pages, as many as there are, and give them back.
 void StoreErasure::clearFreePages() {
-  connection_.execute("DROP TABLE IF EXISTS erased");
+  dropPages(connection_);
   std::int64_t free = connection_.integer("PRAGMA freelist_count");
   if (free == 0) return;
   const std::int64_t pageBytes = connection_.integer("PRAGMA page_size");

@@ -46,8 +46,12 @@ class StoreErasure {
  public:
   StoreErasure(SqliteConnection& connection, std::string storePath);
 
-  /// Overwrites the pages that are free now: they may hold what was removed earlier.
+  /// Overwrites the pages that are free now: they may hold what was removed earlier. The caller
+  /// holds a `StoreFolderLock`, as for `dropPages`.
   void clearFreePages();
+  /// Whether an erasure is at that, or was killed, and so holds pages; and their end.
+  static bool hasLeftPages(SqliteConnection& connection);
+  static void dropPages(SqliteConnection& connection);
   ErasedRows eraseRows(const RowRange& range);
   /// Removes values to which no row refers, when there are no rows.
   void eraseStrayChunks();

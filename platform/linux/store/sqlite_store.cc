@@ -168,7 +168,10 @@ Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
     batch.finish();
     SqliteConnection connection = batch.release();
     StoreErasure erasure(connection, site_.path);
-    erasure.clearFreePages();
+    {
+      const StoreFolderLock lock(site_.path, *site_.busy);
+      erasure.clearFreePages();
+    }
     erased = erasure.eraseRows(range);
     if (range == RowRange()) erasure.eraseStrayChunks();
     erased.isCopied = erasure.copyPages();
@@ -226,7 +229,14 @@ Status SqliteStore::replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Err
 Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {
   std::unique_ptr<SqliteTrim> trim;
   const auto failure = attempt([&](const auto& identity) {
-    if (identity) trim = std::make_unique<SqliteTrim>(openForWriting(Sharing::WithReaders), site_);
+    if (!identity) return;
+    SqliteConnection connection = openForWriting(Sharing::WithReaders);
+    // Its pages would count as the store's, and whole days would go for them.
+    if (StoreErasure::hasLeftPages(connection)) {
+      const StoreFolderLock lock(site_.path, *site_.busy);
+      StoreErasure::dropPages(connection);
+    }
+    trim = std::make_unique<SqliteTrim>(std::move(connection), site_);
   });
   if (failure) return Error{site_.describe(*failure)};
   return trim;
