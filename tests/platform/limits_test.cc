@@ -1,5 +1,6 @@
 // The limits of what a device holds, and what goes when they are exceeded.
 
+#include <cstring>
 #include <numeric>
 #include <sqlite3.h>
 
@@ -223,6 +224,31 @@ TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_EQ(daysHeld(), Days{kToday});
   EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{"2"});
+}
+
+TEST_F(LimitsTest, RunsThatContradictThemselvesTakeNothingOfOthers) {
+  setLastRun(kToday - 1);
+  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  // The first chunk, twice the chunks, the values: 33 chunks of 3, 2^61 of one, none of 3.
+  for (const char* runs : {"004203", "0080808080808080804001", "000003"}) {
+    for (const bool erases : {false, true}) {
+      SCOPED_TRACE(runs);
+      std::filesystem::remove_all(root.path("/var/mobile/Library/Brimhold"));
+      const std::string count(1, runs[std::strlen(runs) - 1]);
+      record({kToday - 2, kToday}, static_cast<std::size_t>(count[0] - '0'));
+      sql("UPDATE distributions SET runs = x'" + std::string(runs) +
+          "' WHERE day = " + std::to_string(kToday - 2));
+      if (erases) {
+        const auto erased = store.erase({"com.example.d", kToday - 2, kToday - 2});
+        ASSERT_TRUE(erased) << erased.error().message;
+        EXPECT_EQ(erased->damaged, 1U);
+      } else {
+        EXPECT_EQ(tidy().failures, Lines{});
+      }
+      EXPECT_EQ(sql("SELECT count FROM distributions"), Lines{count});
+      EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{"4"});
+    }
+  }
 }
 
 TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {

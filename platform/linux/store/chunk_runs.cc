@@ -6,6 +6,11 @@
 namespace tavrel {
 namespace {
 
+// The fewest.
+std::int64_t chunksFor(std::int64_t values) {
+  return values / kValuesPerChunk + (values % kValuesPerChunk != 0 ? 1 : 0);
+}
+
 void appendNumber(std::string& packed, std::int64_t number) {
   auto rest = static_cast<std::uint64_t>(number);
   for (; rest >= 0x80; rest >>= 7)
@@ -26,6 +31,12 @@ std::optional<std::int64_t> takeNumber(std::string_view& packed) {
   return std::nullopt;
 }
 
+// A chunk holds from one value to as many as fit. Whoever removes a run relies on that: with more
+// chunks, it would take those of other runs.
+bool holds(std::int64_t chunks, std::int64_t values) {
+  return chunks >= chunksFor(values) && chunks <= values;
+}
+
 }  // namespace
 
 void appendRun(std::string& packed, const ChunkRun& run) {
@@ -41,7 +52,8 @@ std::optional<std::vector<ChunkRun>> unpackRuns(std::string_view packed) {
     const auto chunks = takeNumber(packed);
     const auto values = takeNumber(packed);
     if (!first || !chunks || !values ||
-        *chunks > std::numeric_limits<std::int64_t>::max() - *first) {
+        *chunks > std::numeric_limits<std::int64_t>::max() - *first ||
+        !holds(*chunks / 2, *values)) {
       return std::nullopt;
     }
     runs.push_back({*first, *chunks / 2, *values, *chunks % 2 != 0});
@@ -79,8 +91,7 @@ std::optional<ChunkRun> runOfSeries(std::int64_t series, std::int64_t values) {
   constexpr int kOrdinalBits = 20;
   constexpr std::int64_t kSeriesEnd = std::int64_t{1} << (62 - kOrdinalBits);
   if (series < 0 || series >= kSeriesEnd) return std::nullopt;
-  const std::int64_t chunks = values / kValuesPerChunk + (values % kValuesPerChunk != 0 ? 1 : 0);
-  return ChunkRun{series << kOrdinalBits, chunks, values, true};
+  return ChunkRun{series << kOrdinalBits, chunksFor(values), values, true};
 }
 
 }  // namespace tavrel

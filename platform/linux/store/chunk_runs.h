@@ -37,7 +37,8 @@ inline constexpr std::int64_t kValuesPerDistribution = std::int64_t{1} << 30;
 
 void appendRun(std::string& packed, const ChunkRun& run);
 
-/// Nothing when the bytes are no runs, or when one refers to chunks that cannot exist.
+/// Nothing when the bytes are no runs, or when one refers to chunks that cannot exist or to more or
+/// fewer than its values can take.
 std::optional<std::vector<ChunkRun>> unpackRuns(std::string_view packed);
 
 /// The values of all runs; nothing when there are more than a distribution may hold.

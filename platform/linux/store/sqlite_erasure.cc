@@ -138,7 +138,9 @@ bool StoreErasure::eraseSome(std::string_view table, std::int64_t day, const std
         row.bind(1, day);
         row.bind(2, std::string_view(key));
         const bool isThere = row.step();
-        const auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
+        auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
+        // What a damaged row refers to may belong to another.
+        if (runs && valuesIn(*runs) != row.integer(0)) runs.reset();
         sum.distributions += isThere ? 1U : 0U;
         sum.values +=
             isThere ? static_cast<std::uint64_t>(std::max<std::int64_t>(row.integer(0), 0)) : 0;
