@@ -1,5 +1,6 @@
 #include "report/log_outcome.h"
 
+#include <algorithm>
 #include <cstddef>
 #include <iterator>
 
@@ -44,10 +45,9 @@ std::string_view nameOf(LogOutcome outcome) {
 
 std::optional<LogOutcome> lastLogOutcome(Preferences& preferences) {
   const plist::Value stored = preferences.ZTXPreferencesGetValue(kLastLogOutcomeKey, kTavrelDomain);
-  for (std::size_t i = 0; i < std::size(kTexts); ++i) {
-    if (stored.string() == kTexts[i].name) return static_cast<LogOutcome>(i);
-  }
-  return std::nullopt;
+  const auto* found = std::ranges::find(kTexts, stored.string(), &OutcomeTexts::name);
+  if (found == std::end(kTexts)) return std::nullopt;
+  return static_cast<LogOutcome>(found - std::begin(kTexts));
 }
 
 void rememberLogOutcome(Preferences& preferences, LogOutcome outcome) {
