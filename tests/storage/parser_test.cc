@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include "base/limits.h"
 #include "recorded_driver.h"
 #include "storage/parse/asp_parser.h"
 #include "storage/parse/statistic_keys.h"
@@ -116,6 +117,19 @@ TEST(ParserTest, CutsNames) {
   EXPECT_TRUE(ASPAppendEntry(context, text.substr(1), "12", 1));
   EXPECT_TRUE(ASPAppendEntry(context, text + "b", "12", 1));
   EXPECT_EQ(listed(context), (std::vector{text.substr(1) + "1=1", text + "=1"}));
+}
+
+TEST(ParserTest, LimitsEntries) {
+  ASPContext context;
+  std::size_t count = 0;
+  while (count <= limits::kStatisticsEntries && ASPAppendEntry(context, "a", "", count))
+    ++count;
+  EXPECT_EQ(count, limits::kStatisticsEntries);
+  count = 0;
+  forEachStatistic(context, [&](std::string_view, const ASPValueEntry& entry) {
+    ASSERT_EQ(entry.value, count++);
+  });
+  EXPECT_EQ(count, limits::kStatisticsEntries);
 }
 
 }  // namespace

@@ -88,11 +88,19 @@ TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
 
 TEST(StructuredLogTest, HasInfiniteAmplificationWithoutHostWrites) {
   Driver driver;
-  driver.answer(kStatistics, statistics({{49, {4096}}, {50, {1}}, {20, {5}}}));
+  driver.answer(kStatistics, statistics({{49, {4096}}, {50, {1}}, {20, {5}}, {84, {1}}}));
   StoragePlatform platform(driver.services(1));
   platform.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 9.5);
   DumpStorageStructuredLog(platform.platform, false);
   EXPECT_TRUE(gNeedValidityList);
+  EXPECT_EQ(gCurrentSysWamp, 0);  // no size of the intermediate bands
+  // 1, which exceeds 0, but that is no threshold.
+  StoragePlatform one(
+      {fakes::driver(answering(statistics({{49, {4096}}, {50, {1}}, {20, {5}}, {4, {5}}})))});
+  one.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 0.0);
+  DumpStorageStructuredLog(one.platform, false);
+  EXPECT_EQ(gCurrentUserWamp, 1);
+  EXPECT_FALSE(gNeedValidityList);
   StoragePlatform without(Array{});
   EXPECT_FALSE(DumpStorageStructuredLog(without.platform, false));
   const std::string none = "Could not get matching Kernkit service for exporting classes\n";
@@ -137,6 +145,10 @@ TEST(StructuredLogTest, SaysWhatFails) {
               "Validity list retrieval is not supported\n"
               "Telemetry list retrieval is not supported\n"
               "Defects list retrieval is not supported\n");
+    EXPECT_FALSE(logStorageLists(platform.platform, *platform.drivers.firstService("ASPStorage"),
+                                 {.characteristicsProperty = "Device Characteristics",
+                                  .defectsList = []() -> const SelectorTable* { return nullptr; }},
+                                 false));
   }
   // The caller's flag goes along with both steps.
   Driver flagged;
@@ -176,8 +188,8 @@ TEST(StructuredLogTest, RefusesTelemetryThatItCannotPlace) {
   log(with("manufacturer-id", true), 4128, "manufacturer-id is not stored as a CFStringTypeID");
   log(with("num-bus", {}), 4128, noChannels);
   log(with("num-bus", "1"), 4128, noChannels);
-  log(Dictionary{{"chip-id", ""}, {"manufacturer-id", "1G"}}, 0, noChannels,
-      "unrecognized hex character: g");
+  log(Dictionary{{"chip-id", ""}, {"manufacturer-id", "1Z"}}, 0, noChannels,
+      "unrecognized hex character: z");
   log(good, 4127, bounds);
   log(with("num-bus", INT32_MAX), 4128, bounds);
   log(good, 4128, "");
