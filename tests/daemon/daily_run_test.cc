@@ -69,7 +69,14 @@ TEST_F(DailyRunTest, RunsOncePerDay) {
 
 TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
   fake.store.keepsValues = false;
-  runDailyIfNeeded(fake.platform, {});
+  Messages steps;
+  runDailyIfNeeded(fake.platform, {}, [&](std::string_view step) { steps.emplace_back(step); });
+  EXPECT_EQ(
+      steps,
+      (Messages{"Once-a-day gate", "Daily tasks", "Checkpoint of the statistics store", "Report",
+                "Storage statistics", "Disk space", "Structured storage log and NAND information",
+                "ECC events", "Report channels", "Clean-up of structured records",
+                "OS changes and tasking", "Roll-over of the support log", "End of the gated run"}));
   EXPECT_FALSE(storedDay());
   EXPECT_EQ(fake.journal.back(), "synchronize com.norvane.tallied.tavrel");
   EXPECT_EQ(fake.log.messages().back(),

@@ -131,6 +131,10 @@ TEST_F(TaskingTest, SubmitsAtOnceForSomeDaysAfterAnUpdate) {
   fake.submission.taskingValues.set("AggressiveSubmissionDays", 3);
   schedule({{"TaskingID", 1}});
   EXPECT_EQ(track(), Journal{});
+  // One that cannot be applied is scheduled.
+  const std::string tooLong(1048259, 'x');
+  schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", tooLong)}}});
+  EXPECT_EQ(track(), Journal{"submit now"});
 }
 
 }  // namespace
