@@ -113,6 +113,7 @@ TEST(Binary, HostileObjectsAreRefused) {
       {{"\x4F\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"s},
        "8: the object does not end before the table of offsets"},
       {{"\x4F\x22\0\0\0\1"s}, "9: the length of an object is not an integer of 1 to 8 bytes"},
+      {{"\xAF\x22\0\0\0\1"s}, "9: the length of an object is not an integer of 1 to 8 bytes"},
       {{"\xD1\1"s}, "8: the object does not end before the table of offsets"},
       {{"\x51\xE9"s}, "8: a byte of a text is not ASCII"},
       {{"\xA1\1"s}, "9: a reference to object 1, where there are 1"},
