@@ -246,6 +246,7 @@ TEST(Upload, JudgesEachLogByItsDay) {
                  "<date>2026-11-26T00:00:00Z</date></dict></plist>");
     std::set<std::string> sent;
     ScriptedServer server([&](const std::string& request) {
+      EXPECT_NE(request.find("\r\nContent-Type: application/octet-stream\r\n"), request.npos);
       sent.insert(request.substr(10, request.find(".log ") - 10));  // "PUT /logs/"
       return kOk;
     });
