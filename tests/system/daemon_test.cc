@@ -32,14 +32,19 @@ void runDaemon(const DeviceRoot& root, const char* argument) {
   runTavrel(linuxPlatform.platform(), arguments);
 }
 
-/// Runs the built program and yields what it logged, without the times.
-std::string logBelow(const std::string& root, const char* argument, const std::string& errors) {
-  EXPECT_EQ(waitFor(forkProcess([&] { executeBelow(root, argument); }, errors)), 0);
+/// What a program logged, without the times.
+std::string loggedIn(const std::string& errors) {
   std::istringstream lines(contentOf(errors));
   std::string log;
   for (std::string line; std::getline(lines, line);)
     log += line.substr(line.find(' ') + 1) + '\n';
   return log;
+}
+
+/// Runs the built program and yields what it logged.
+std::string logBelow(const std::string& root, const char* argument, const std::string& errors) {
+  EXPECT_EQ(waitFor(forkProcess([&] { executeBelow(root, argument); }, errors)), 0);
+  return loggedIn(errors);
 }
 
 constexpr int kEccEvents = 3;
@@ -231,6 +236,32 @@ TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
             "error cannot use device root " + none +
                 "/: No such file or directory: name the device's folder with TAVREL_ROOT\n");
   EXPECT_FALSE(std::filesystem::exists(none));
+}
+
+TEST(HealthProgramTest, SaysWhatItCannotReadOrWrite) {
+  const TemporaryRoot device;
+  const std::string errors = device.root.path("/errors");
+  const auto run = [&](const std::string& root, int status) {
+    const auto program = [&] {
+      ::setenv("TAVREL_ROOT", root.c_str(), 1);
+      ::execl(TAVREL_HEALTH_BINARY, "tavrel-health", nullptr);
+      ::_exit(127);
+    };
+    EXPECT_EQ(waitFor(forkProcess(program, errors)), status);
+    return loggedIn(errors);
+  };
+  const std::string none = device.root.path("/none");
+  EXPECT_EQ(run(none, 1), "error cannot use device root " + none +
+                              "/: No such file or directory: name the device's folder with "
+                              "TAVREL_ROOT\n");
+  EXPECT_EQ(run(device.root.path("/"), 0), "");
+  const std::string memory = device.root.path("/var/lib/tavrel/health/memory.plist");
+  EXPECT_TRUE(std::filesystem::remove(memory));
+  std::filesystem::create_directories(memory);
+  EXPECT_EQ(run(device.root.path("/"), 1),
+            "error cannot use remembered counters " + memory + ", starting again: cannot use " +
+                memory + ": it is a folder; move it away\n" +
+                "error cannot keep counters: cannot put in place " + memory + ": Is a directory\n");
 }
 
 TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
