@@ -16,6 +16,10 @@ std::string gunzipped(const std::string& path) {
   return {text, static_cast<std::size_t>(std::max(0, gzread(file.get(), text, sizeof text)))};
 }
 
+const char* const kOfTheDayBefore =
+    "<plist version=\"1.0\"><dict><key>BHStartDate</key>"
+    "<date>2026-11-26T00:00:00Z</date></dict></plist>";
+
 TEST(Upload, SendsAllToNginxOldestFirst) {
   Nginx nginx;
   Device device;
@@ -176,6 +180,14 @@ TEST(Upload, GivesUpWhatTheServerRefusesAndKeepsTheNewest) {
   EXPECT_EQ(device.run(), Outcome::Done);
   EXPECT_EQ(device.names("refused").size(), 2 * 16U);
   EXPECT_EQ(device.names("refused")[0], nameOf(44) + ".log");
+  // A log that is held does not make the run go on.
+  device.permit("<true/>", "<integer>20784</integer>");
+  device.add(nameOf(60));
+  device.add(nameOf(61));
+  device.write(kOutbox + nameOf(61) + ".log", kOfTheDayBefore);
+  device.configuration.run = std::chrono::seconds(3);
+  EXPECT_EQ(device.run(), Outcome::Done);
+  EXPECT_EQ(device.names().size(), 2U);
 }
 
 TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
@@ -241,9 +253,7 @@ TEST(Upload, JudgesEachLogByItsDay) {
     device.permit("<true/>", firstDay);
     device.add(kNand);  // has no day of its own
     device.add(nameOf(1));
-    device.write(kOutbox + nameOf(1) + ".log",
-                 "<plist version=\"1.0\"><dict><key>BHStartDate</key>"
-                 "<date>2026-11-26T00:00:00Z</date></dict></plist>");
+    device.write(kOutbox + nameOf(1) + ".log", kOfTheDayBefore);
     std::set<std::string> sent;
     ScriptedServer server([&](const std::string& request) {
       EXPECT_NE(request.find("\r\nContent-Type: application/octet-stream\r\n"), request.npos);
