@@ -1,5 +1,6 @@
 """A device in a folder, and its programs, whose clocks show what the driver says."""
 
+import collections
 import fcntl
 import mmap
 import os
@@ -85,6 +86,7 @@ class Device:
         self.environment = {"PATH": os.environ["PATH"], "TAVREL_ROOT": str(root),
                             "LD_PRELOAD": str(library), "LIFE_CLOCK": str(clock.path)}
         self.peaks = {}
+        self.kills = collections.Counter()  # that took place, by program
         self.residents = {}
 
     # -- Files --------------------------------------------------------------------------------
@@ -142,8 +144,10 @@ class Device:
         ended = Ended(done.returncode, done.stdout, done.stderr, self.clock)
         if ended.status < 0 and not (kill_at and ended.status == -9):
             raise Fault(f"signal {-ended.status} ends {' '.join(command)}: {ended.err}")
+        name = " ".join(command[:1 if command[0] == "tavrel" else 3])
+        if kill_at:
+            self.kills[name] += ended.status == -9
         if ended.status >= 0:
-            name = " ".join(command[:1 if command[0] == "tavrel" else 3])
             self.peaks[name] = max(self.peaks.get(name, 0), ended.peak)
         return ended
 

@@ -58,7 +58,7 @@ class Life:
         self.counts = {}
         self.number = 0  # of memory errors
         self.updates = 0
-        self.leftovers = 0
+        self.scalar_keys = set()  # of stores that were damaged later
         self.begin()
 
     def count(self, what, number=1):
@@ -124,7 +124,7 @@ class Life:
                                "r": [f"com.example.v{self.updates}.seconds"]}, 20)
         self.device.residents.pop("killed")
         recorder.process.kill()
-        recorder.process.wait()
+        self.device.kills["recorder"] += recorder.process.wait() == -9
         recorder.process.stdin.close()
         recorder.process.stdout.close()
 
@@ -233,12 +233,13 @@ class Life:
 
     def disturbed_run(self, disturb):
         """A run that something befalls, and the next one, which makes up for it. A log may lack
-        something only when the run says so; it is then filed again by hand."""
+        something only when the run says so; it is then filed again by hand. False when no run was
+        due."""
         self.before_run()
         before = copy.deepcopy(self.model, {id(self.model.ever): self.model.ever})
         effects = self.model.gated(self.clock, self.build_day, self.metadata)
         if effects is None:
-            return
+            return False
         said = " error " in disturb().err
         waiting, self.withheld = self.logs()
         new = waiting - self.waiting
@@ -258,7 +259,7 @@ class Life:
             self.device.run("tavrel", "-d")
         elif is_filed:
             self.fold()  # which takes in what could not be committed
-            return
+            return True
         else:
             expect(said, f"no log of day {effects['day']}, and nobody says why")
             self.count("logs filed by hand")
@@ -266,6 +267,7 @@ class Life:
                                      self.metadata)
             self.device.run("tavrel", "-f")
         self.check_effects(again, disturbed=True)
+        return True
 
     def adopt(self, before):
         """Takes over the state that a disturbed run has left: each preference has its old or its

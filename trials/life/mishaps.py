@@ -1,4 +1,5 @@
-"""What befalls a device in its life. Each function is one event; the names count in the summary."""
+"""What befalls a device in its life. Each function is one event, which returns False when nothing
+could befall it; the names count in the summary."""
 
 import os
 
@@ -128,22 +129,25 @@ class Mishaps(Life):
     # -- Clocks ---------------------------------------------------------------------------------
 
     def clock_is_wrong(self, days, lasts):
-        if self.repair_clock_at is None:
-            self.clock.set_wrong(days * SECONDS_PER_DAY)
-            self.repair_clock_at = self.clock.true + lasts
+        if self.repair_clock_at is not None:
+            return False
+        self.clock.set_wrong(days * SECONDS_PER_DAY)
+        self.repair_clock_at = self.clock.true + lasts
+        return True
 
     def clock_ahead(self):
         far = self.chance.random() < 0.5
-        self.clock_is_wrong(self.chance.randrange(30, 2000) if far else self.chance.randrange(1, 4),
-                            self.chance.randrange(3, 60) * 3600)
+        days = self.chance.randrange(30, 2000) if far else self.chance.randrange(1, 4)
+        return self.clock_is_wrong(days, self.chance.randrange(3, 60) * 3600)
 
     def clock_behind(self):
-        self.clock_is_wrong(-self.chance.randrange(1, 12), self.chance.randrange(3, 90) * 3600)
+        return self.clock_is_wrong(-self.chance.randrange(1, 12),
+                                   self.chance.randrange(3, 90) * 3600)
 
     def clock_in_1970(self):
         self.fold()
-        self.clock_is_wrong(-(self.clock.true // SECONDS_PER_DAY),
-                            self.chance.randrange(3, 50) * 3600)
+        return self.clock_is_wrong(-(self.clock.true // SECONDS_PER_DAY),
+                                   self.chance.randrange(3, 50) * 3600)
 
     def repair_clock(self):
         self.clock.set_wrong(0)
@@ -162,7 +166,7 @@ class Mishaps(Life):
             1, {"tavrel": 120}.get(command[0], 12)))
 
     def killed_run(self):
-        self.disturbed_run(lambda: self.kill("tavrel", "-d"))
+        return self.disturbed_run(lambda: self.kill("tavrel", "-d"))
 
     def killed_fold(self):
         self.activity()
@@ -172,7 +176,7 @@ class Mishaps(Life):
     def full_disk(self):
         """Programs record and fold, and the daily run comes, while there is hardly any room."""
         if not os.path.ismount(self.device.path("var")):
-            return
+            return False
         room = self.chance.choice([0, 4, 16, 36, 60, 80, 110, 150, 400])
         self.activity()
 
@@ -180,13 +184,15 @@ class Mishaps(Life):
             self.device.fill(room)
             self.device.run("tavrelctl", "stat", "fold")
             done = self.device.run("tavrel", "-d")
+            self.count("daily runs that a full disk disturbs", " error " in done.err)
             if not self.over_limits():
                 self.device.run("tavrelctl", "tidy")
             self.device.empty()
             return done
 
-        self.disturbed_run(run)
+        was_due = self.disturbed_run(run)
         self.fold()
+        return was_due
 
     def over_limits(self):
         return self.excess_days(self.days_held()) or any(map(self.excess_logs,
@@ -196,7 +202,8 @@ class Mishaps(Life):
         self.fold()
         # Values without a date, which memory may still have, would be dated by a wrong clock.
         if self.clock.wrong:
-            return
+            return False
+        self.scalar_keys.update(self.device.rows("SELECT DISTINCT key FROM scalars"))
         self.model.stored.remove()
         self.activity()
         for ending in ("-wal", "-shm"):
@@ -206,17 +213,21 @@ class Mishaps(Life):
         self.model.corruptions += 1
         self.fold()
         self.check_new_store(self.model.stored)
+        return True
 
     def corrupt_preferences(self):
         path = self.device.path(PREFERENCES) / f"{OWN}.plist"
-        if path.exists():
-            path.write_bytes(path.read_bytes()[:self.chance.randrange(60)])
-            self.model.own = {}
+        if not path.exists():
+            return False
+        path.write_bytes(path.read_bytes()[:self.chance.randrange(60)])
+        self.model.own = {}
+        return True
 
     def junk(self):
-        for name in JUNK_FILES:
-            if self.device.path(name).exists():
-                self.device.write(name, self.chance.randbytes(100))
+        there = [name for name in JUNK_FILES if self.device.path(name).exists()]
+        for name in there:
+            self.device.write(name, self.chance.randbytes(100))
+        return bool(there)
 
     def foreign_segment(self):
         name = f"run/tavrel/stat/{self.chance.randrange(10 ** 9)}.segment"
@@ -227,10 +238,12 @@ class Mishaps(Life):
 
     def torn_record(self):
         """The end of a record that a power cut has left."""
-        if self.records_of_today().exists():
-            with open(self.records_of_today(), "ab") as file:
-                file.write(b'{"time":"20')
-            self.memory_error()
+        if not self.records_of_today().exists():
+            return False
+        with open(self.records_of_today(), "ab") as file:
+            file.write(b'{"time":"20')
+        self.memory_error()
+        return True
 
 
 # Per thousand days.

@@ -59,8 +59,8 @@ class Years(Mishaps):
             self.activity()
             if number == happens_at:
                 for name in today:
-                    getattr(self, name)()
-                    self.count(f"event {name}")
+                    took_place = getattr(self, name)() is not False
+                    self.count(f"event {name}" if took_place else f"event {name}, in vain")
             if number == runs_at:
                 self.daily_run()
             if chance.random() < 0.5:
@@ -161,3 +161,5 @@ class Years(Mishaps):
                                                  sorted(fates.items(), key=lambda item: -item[1])))
         for name, number in sorted(self.counts.items()):
             print(f"{number:9} {name}")
+        for name, number in sorted(self.device.kills.items()):
+            print(f"{number:9} kills of {name}")
