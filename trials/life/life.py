@@ -12,7 +12,7 @@ import struct
 
 from device import (Fault, PREFERENCES, RECORDS, Recorder, SECONDS_PER_DAY, STORE, SUBMISSION,
                     Sampler, Statsd)
-from model import LAST_RUN, Model, OWN, Statistics, TRACKED, date_text, moment
+from model import LANGUAGES, LAST_RUN, Model, OWN, Statistics, TRACKED, date_text, moment
 
 DRIVER = pathlib.Path(__file__).parents[2] / "docs/examples/registry/storage.plist"
 EVENTS = "var/lib/tavrel/ecc-events"
@@ -51,7 +51,6 @@ class Life:
         self.device, self.clock, self.chance = device, device.clock, chance
         self.build_day, self.recorder_program = build_day, recorder
         self.model = Model()
-        self.metadata = None
         self.waiting, self.withheld = set(), set()  # names of logs
         self.limits = {"Store": 90, "Pending": 60, "Outbox": 60}
         self.limits_are_whole = True
@@ -71,6 +70,7 @@ class Life:
         self.device.write("var/lib/tavrel/registry/storage.plist", DRIVER.read_bytes())
         self.update_system()
         self.update_whitelist()
+        self.device.write("etc/tavrel/languages", LANGUAGES)
         self.recorder = Recorder(self.device, "recorder", self.recorder_program)
         self.statsd = Statsd(self.device)
         self.sampler = Sampler(self.device)
@@ -178,8 +178,6 @@ class Life:
 
     def check_log(self, name, effects):
         log = plistlib.loads(self.read_log(name))
-        if self.metadata is None:
-            self.metadata = effects["log"]["BHMetadata"] = log["BHMetadata"]
         wrong = differences(log, effects["log"]) + differences(
             plistlib.loads(self.read_log(name, ".metadata.plist")), effects["metadata"])
         expect(not wrong, f"log of day {effects['day']}: {'; '.join(wrong)}")
@@ -214,7 +212,7 @@ class Life:
 
     def daily_run(self):
         self.before_run()
-        effects = self.model.gated(self.clock, self.build_day, self.metadata)
+        effects = self.model.gated(self.clock, self.build_day)
         done = self.device.run("tavrel", "-d")
         if effects is None:
             expect("Day unchanged since last run" in done.err, f"a run took place: {done.err}")
@@ -237,7 +235,7 @@ class Life:
         due."""
         self.before_run()
         before = copy.deepcopy(self.model, {id(self.model.ever): self.model.ever})
-        effects = self.model.gated(self.clock, self.build_day, self.metadata)
+        effects = self.model.gated(self.clock, self.build_day)
         if effects is None:
             return False
         said = " error " in disturb().err
@@ -255,7 +253,7 @@ class Life:
                 expect(said, f"nobody says why: {fault}")
         self.waiting = waiting
         if not self.adopt(before):
-            again = self.model.gated(self.clock, self.build_day, self.metadata)
+            again = self.model.gated(self.clock, self.build_day)
             self.device.run("tavrel", "-d")
         elif is_filed:
             self.fold()  # which takes in what could not be committed
@@ -263,8 +261,9 @@ class Life:
         else:
             expect(said, f"no log of day {effects['day']}, and nobody says why")
             self.count("logs filed by hand")
-            again = self.model.tasks(self.clock.today - 1, self.clock, self.build_day,
-                                     self.metadata)
+            again = self.model.tasks(effects["day"], self.clock, self.build_day)
+            if before.fates.get(effects["day"]) != "reported":
+                self.model.note_fate(effects["day"], "filed by hand", self.clock)
             self.device.run("tavrel", "-f")
         self.check_effects(again, disturbed=True)
         return True

@@ -5,7 +5,7 @@ import os
 
 from device import PREFERENCES, SECONDS_PER_DAY, STORE, SUBMISSION, WHITELIST
 from life import Life, expect
-from model import DA, LAST_RUN, OTHER, OWN, date_text
+from model import DA, LAST_RUN, LOCALES, OTHER, OWN, date_text
 
 LIMITS = "etc/tavrel/limits.plist"
 VERSION = "etc/tavrel/system-version.plist"
@@ -47,6 +47,8 @@ class Mishaps(Life):
             "ProductName": "Pellio", "ProductVersion": f"{4 + self.updates // 10}.{self.updates}",
             "ProductBuildVersion": f"16R{300 + self.updates}"}
         self.device.write(VERSION, self.model.version)
+        locale, self.model.locale = self.chance.choice(LOCALES)
+        self.device.write("etc/locale.conf", locale)
 
     def update_whitelist(self):
         chance = self.chance

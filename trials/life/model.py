@@ -13,6 +13,17 @@ DA = "com.norvane.da"
 OTHER = "com.example.settings"  # a domain of another program
 CAPACITY = 32 << 30
 NAND_PERIOD = 7 * SECONDS_PER_DAY
+REPORTED = ("reported", "filed by hand")  # fates that a further run does not change
+LANGUAGES = b"en\nde\nzh-Hant\n"  # that the device shows
+LOCALES = [  # /etc/locale.conf, and what a log says of it
+    (b"", {"BHUserInterfaceLanguage": "<unknown>",
+           "BHPreferredUserInterfaceLanguage": "<unknown>"}),
+    (b"LANG=de_AT.UTF-8\nLC_MEASUREMENT=de_CH.UTF-8\nLANGUAGE=de_AT:de:en\n",
+     {"BHUserInterfaceLanguage": "de", "BHPreferredUserInterfaceLanguage": "de-AT",
+      "BHUserSetRegionFormat": "CH"}),
+    (b"LANG=fr_FR.UTF-8\n",
+     {"BHUserInterfaceLanguage": "en", "BHPreferredUserInterfaceLanguage": "fr-FR",
+      "BHUserSetRegionFormat": "FR"})]
 TRACKED = ("com.example.", "statsd.", "com.norvane.usage.samples", "com.norvane.tavrel.limits.",
            "com.norvane.brimhold.", "com.norvane.lumenhall.DiskUsageUserTotalBlocks")
 
@@ -95,7 +106,7 @@ class Model:
         self.ever = Statistics()  # whatever became of it
         self.whitelist, self.whitelist_bytes = None, b""
         self.permitted, self.first_day = False, None
-        self.version = {}
+        self.version, self.locale = {}, {}
         self.own = {}                       # the daemon's preferences
         self.domains = {DA: {}, OTHER: {}}  # what a tasking has set
         self.scheduled = None
@@ -142,7 +153,7 @@ class Model:
                     found = (len(prefix), options)
         return None if found is None else found[1]
 
-    def log(self, day, clock, metadata):
+    def log(self, day, clock):
         """The content of the day's log, or why there is none."""
         if not self.covers(clock.today - 1):
             return "not-permitted"
@@ -167,7 +178,7 @@ class Model:
             if (options := self.options("Scalar", key)) is not None:
                 scalars[key] = coarsened(value, options)
         return {"BHCrashLogVersion": 1, "BHStartDate": moment(day * SECONDS_PER_DAY),
-                "BHLogCreationDate": moment(clock.now), "BHMetadata": metadata,
+                "BHLogCreationDate": moment(clock.now), "BHMetadata": self.locale,
                 "BHScalars": scalars, "BHDistributions": distributions,
                 "BHDistributionsHistogram": histograms,
                 "BHTasking": self.own.get("TaskingPayload", []),
@@ -188,14 +199,20 @@ class Model:
             self.own["LastOSVersion"] = self.version_text()
         return found
 
-    def gated(self, clock, build_day, metadata):
+    def note_fate(self, day, fate, clock):
+        """Of a day that is over; what a clock that is ahead does for a day to come is not its
+        fate."""
+        if day < clock.true // SECONDS_PER_DAY:
+            self.fates[day] = fate
+
+    def gated(self, clock, build_day):
         """What a daily run does: the line about days without a run, and the effects of the tasks;
         None when the gate is shut."""
         day = clock.today - 1
         last = self.own.get(LAST_RUN)
         if (last or 0) >= day:
-            if last and last > day:
-                self.fates.setdefault(day, "the clock was set back")
+            if day not in self.fates:
+                self.note_fate(day, "no run before the clock has passed the last one", clock)
             return None
         line = None
         if last is not None and 1 < day - last <= 3660:
@@ -204,27 +221,28 @@ class Model:
                     else f"{len(passed)} days had no run and will not be reported: "
                          f"{passed[0]} to {passed[-1]}")
             for each in passed:
-                self.fates.setdefault(each, "no run")
-        effects = self.tasks(day, clock, build_day, metadata)
+                if each not in self.fates:
+                    self.note_fate(each, "no run", clock)
+        effects = self.tasks(day, clock, build_day)
         effects["line"] = line
         self.own["LastLogOutcome"] = effects["outcome"]
         self.own[LAST_RUN] = day
         return effects
 
-    def tasks(self, day, clock, build_day, metadata):
+    def tasks(self, day, clock, build_day):
         self.fold(clock, build_day)
         effects = {"day": day, "log": None, "metadata": None, "deletes": not self.permitted,
                    "sends": False, "nand": None}
         if not self.permitted:
             self.first_day = None
-        log = self.log(day, clock, metadata)
+        log = self.log(day, clock)
         effects["outcome"] = log if isinstance(log, str) else "filed"
         if not isinstance(log, str):
             effects["log"], effects["metadata"] = log, self.metadata(clock)
             if self.options("Scalar", "com.norvane.zentrix.bhd.database.corruptions") is not None:
                 self.corruptions = 0
-        self.fates[day] = "reported" if effects["log"] or self.fates.get(day) == "reported" \
-            else effects["outcome"]
+        if self.fates.get(day) not in REPORTED:
+            self.note_fate(day, "reported" if effects["log"] else effects["outcome"], clock)
         if self.last_nand is None or clock.now - self.last_nand >= NAND_PERIOD:
             effects["nand"] = "pending" if self.covers(clock.today) else "withheld"
             self.last_nand = clock.now

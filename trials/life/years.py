@@ -2,7 +2,7 @@
 
 import os
 
-from device import Fault, RECORDS, SECONDS_PER_DAY, STORE
+from device import RECORDS, SECONDS_PER_DAY, STORE
 from life import expect
 from mishaps import EVENTS, Mishaps
 
@@ -148,14 +148,8 @@ class Years(Mishaps):
         last = self.clock.true // SECONDS_PER_DAY
         for day in range(first, end):
             fate = self.model.fates.get(day)
-            if fate is None and day in self.off:
-                fate = "the device was off"
-            if fate is None and {day, day + 1} & self.wrong:
-                fate = "the clock was wrong then or when its run was due"
-            if fate is None and day >= last:
-                fate = "not over"
-            if fate is None:
-                raise Fault(f"nobody knows what became of day {day}: {self.lately(day)}")
+            if fate in (None, "no run"):
+                fate = self.reason(day, last)
             fates[fate] = fates.get(fate, 0) + 1
         print(f"{end - first} days: " + ", ".join(f"{number} {fate}" for fate, number in
                                                  sorted(fates.items(), key=lambda item: -item[1])))
@@ -163,3 +157,12 @@ class Years(Mishaps):
             print(f"{number:9} {name}")
         for name, number in sorted(self.device.kills.items()):
             print(f"{number:9} kills of {name}")
+
+    def reason(self, day, last):
+        """Why a day that is not reported had no run."""
+        if {day, day + 1} & self.off:
+            return "no run: the device was off"
+        if {day, day + 1} & self.wrong:
+            return "no run: the clock was wrong"
+        expect(day >= last, f"nobody knows what became of day {day}: {self.lately(day)}")
+        return "not over"
