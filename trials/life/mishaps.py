@@ -208,6 +208,7 @@ class Mishaps(Life):
         self.scalar_keys.update(self.device.rows("SELECT DISTINCT key FROM scalars"))
         self.model.stored.remove()
         self.activity()
+        self.killed_recorder()
         for ending in ("-wal", "-shm"):
             self.device.path(STORE + ending).unlink(missing_ok=True)
         size = self.device.path(STORE).stat().st_size

@@ -24,7 +24,7 @@ class Years(Mishaps):
         self.off, self.wrong = set(), set()
         first = self.clock.true // SECONDS_PER_DAY
         year, self.figures = 0, []
-        day = first
+        day, compare_at = first, first + 9
         while day < first + days:
             self.day(day)
             lived = day + 1 - first
@@ -36,8 +36,9 @@ class Years(Mishaps):
             day += 1
             if lived >= min(WARM_UP, days) and not self.figures:
                 self.figures.append(self.measure())
-            if lived % 30 == 0:
+            if day >= compare_at:
                 self.check_statistics()
+                compare_at = day + 10
             if (day - first) // 365 > year or day >= first + days:
                 year = (day - first) // 365
                 self.end_of_year(year, day - first)
