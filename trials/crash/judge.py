@@ -2,9 +2,11 @@
 """Mounts states that a power cut could have left, and checks each.
 
     judge.py FILE-SYSTEM PROGRAMS RECORDING DAY [--states N] [--seconds N] [--seed N] [--state N]
+             [--script COMMAND]
 
-State numbers begin with the points after each flush, FUA write and step; the others are torn. Ends
-with 1 when a state breaks a promise.
+State numbers begin with the points after each flush, FUA write and mark; the others are torn. For a
+broken state it prints COMMAND with what makes the state again. Ends with 1 when a state breaks a
+promise, or when there was no time to judge any.
 """
 
 import argparse
@@ -20,12 +22,13 @@ import time
 
 from contents import tree_digest
 from days import Device, steps
-from f2fs import UnawaitedNodes
+from f2fs import UnawaitedNodes, has_fault
 from file_systems import KINDS, Loop, call, mount, mount_in_private, unmount
 from verdict import Undisturbed
 from write_log import FLUSH, FUA, MARK, Image, WriteLog, torn
 
 ROUND = 500  # states that are made in one pass over the log
+# All before the position is there, and some of what is from there to the cut, if there is a cut.
 State = collections.namedtuple("State", "number position cut")
 
 
@@ -42,7 +45,8 @@ class Judge:
         self.undisturbed = Undisturbed(
             options.recording / "after", work, self.steps,
             Device(work / "undisturbed", options.programs, work / "preload.so"))
-        self.unawaited = UnawaitedNodes(self.log) if self.kind.type == "f2fs" else None
+        kernel = (options.recording / "kernel").read_text("ascii")
+        self.unawaited = UnawaitedNodes(self.log) if has_fault(self.kind, kernel) else None
         self.image = (work / "image").open("w+b")
         self.devices = {}  # verdicts by step and what is on the device
         self.seen = {}  # by step and content
@@ -51,16 +55,20 @@ class Judge:
         self.find_points()
 
     def find_points(self):
-        """Positions in the log: where all before is durable, and the windows between flushes."""
-        self.marks, self.points, flushes = [], [], []
+        """Positions in the log where all before is durable, and the windows between flushes. After
+        a mark, what was not flushed is lost: it comes with the next flush."""
+        self.marks, self.points, flushes, waiting = [], [], [], 0
         for number, entry in enumerate(self.log.entries):
+            waiting = 0 if entry.flags & FLUSH else waiting + (not entry.flags & (FUA | MARK))
             if entry.flags & MARK:
+                if waiting:
+                    raise ValueError("a write stands in the log before it was flushed")
                 self.marks.append((number, entry.data.split(":")))
             if self.marks:
                 if entry.flags & FLUSH:
                     flushes.append(number)
-                self.points += [number] if entry.flags & (FLUSH | MARK) else []
-                self.points += [number + 1] if entry.flags & FUA else []
+                self.points += [number] if entry.flags & FLUSH else []
+                self.points += [number + 1] if entry.flags & (FUA | MARK) else []
         self.points = sorted(set(self.points + [len(self.log.entries)]))
         ends = flushes[1:] + [len(self.log.entries)]
         self.windows = [(start, end) for start, end in zip(flushes, ends)
@@ -91,7 +99,7 @@ class Judge:
         device = *where, state.position, pieces
         if device not in self.devices:
             fault, lost = self.verdict(state, *where, pieces), False
-            late = self.late(state, pieces) if fault and self.kind.type == "f2fs" else None
+            late = self.late(state, pieces) if fault and self.unawaited else None
             if late is not None:
                 lost = not self.verdict(state, *where, (*pieces, (late, None)))
             self.devices[device] = number, fault, lost
@@ -155,7 +163,7 @@ class Judge:
                     self.failures += not lost
                     print(f"{self.options.kind}: state {state.number}, in "
                           f"'{self.steps[number - 1].name}': {fault}: look at it with "
-                          f"script/crash-test --file-system {self.options.kind} --again "
+                          f"{self.options.script} --file-system {self.options.kind} --again "
                           f"--seed {self.options.seed} --state {state.number}", flush=True)
                 if self.judged["states"] // 100 != told:
                     told = self.judged["states"] // 100
@@ -180,6 +188,7 @@ def main():
     parser.add_argument("--seconds", type=float, default=1e9)
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--state", type=int)
+    parser.add_argument("--script", default="script/crash-test")
     options = parser.parse_args()
     mount_in_private()
     work = pathlib.Path(tempfile.mkdtemp(prefix="tavrel_crash.", dir="/dev/shm"))
@@ -189,6 +198,8 @@ def main():
     finally:
         shutil.rmtree(work)
     print(judge.summary(), flush=True)
+    if not judge.judged["states"]:
+        sys.exit(f"{options.kind}: nothing was judged: give more --seconds or --states")
     sys.exit(judge.failures > 0)
 
 

@@ -3,10 +3,12 @@
 
     record.py FILE-SYSTEM PROGRAMS DAY LOG AFTER
 
-The log of writes goes to the disk LOG; as a tar file, the device after each step to AFTER.
+The log of writes goes to the disk LOG; as a tar file, the device after each step and the kernel's
+version to AFTER.
 """
 
 import pathlib
+import platform
 import shutil
 import subprocess
 import sys
@@ -57,7 +59,8 @@ def main():
     unmount(root)
     call("dmsetup", "remove", NAME)
     loop.close()
-    subprocess.run(["tar", "--create", "--file", tar, "--directory", WORK, "after"],
+    (WORK / "kernel").write_text(platform.release(), encoding="ascii")
+    subprocess.run(["tar", "--create", "--file", tar, "--directory", WORK, "after", "kernel"],
                    check=True)
 
 

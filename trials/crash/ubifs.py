@@ -6,7 +6,7 @@ what a power cut would leave. It is written to another partition, mounted and ch
     ubifs.py PROGRAMS DAY STATES SECONDS SEED [FOLDER]
 
 FOLDER has nand.ko and nandsim.ko, where the kernel lacks them. Ends with 1 when a state breaks a
-promise.
+promise, or when there was no time to judge any.
 """
 
 import os
@@ -213,6 +213,8 @@ def main():
             print(f"ubifs: {judged} of {len(chosen)} states, {broken} broken", flush=True)
     print(f"ubifs: {judged} states of {len(chosen)} that were taken, of {len(seen)} different "
           f"contents, {broken} broken", flush=True)
+    if not judged:
+        sys.exit("ubifs: nothing was judged: give more --seconds or --states")
     sys.exit(broken > 0)
 
 

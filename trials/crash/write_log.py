@@ -7,7 +7,8 @@ import struct
 SECTOR = 512
 MAGIC = 0x6A736677736872
 FLUSH, FUA, DISCARD, MARK = 1, 2, 4, 8
-# A flush makes durable what stands before it; FUA makes durable what is written with it.
+# A flush makes durable what stands before it; FUA makes durable what is written with it. A write
+# without FUA is logged with the next flush after its end, so a mark may come before it.
 Entry = collections.namedtuple("Entry", "flags start length data")
 
 
