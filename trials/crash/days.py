@@ -218,4 +218,5 @@ def steps(day):
         Step("forced run", second, third, False, runs("tavrel", "-f"), ()),
         Step("erasure", second, third, False, runs(*erase), (erase,)),
         Step("withdrawal", second, third, False, runs(*deny), (deny,)),
+        Step("rest", second, third, True, lambda device: None, ()),  # the withdrawal is done
     ]
