@@ -31,27 +31,27 @@ def is_fsynced_node(log, entry, version):
 
 class UnawaitedNodes:
     def __init__(self, log):
+        """Finds such writes: each came right after the flush of its fsync, and right before another
+        write; before another flush it could be of an fsync that has not returned."""
         self.log = log
-        self.positions = []
+        self.after = {}  # the positions, by that of the flush
         version = None
-        for position, entry in enumerate(log.entries):
+        numbers = [number for number, entry in enumerate(log.entries) if not entry.flags & MARK]
+        for before, number, behind in zip(numbers, numbers[1:], numbers[2:]):
+            entry = log.entries[number]
             if entry.flags & FUA and entry.length == BLOCK:  # the end of a checkpoint
                 version = struct.unpack_from("<I", log.content(entry))[0]
             elif version is not None and is_fsynced_node(log, entry, version):
-                self.positions.append(position)
                 version = None
+                if log.entries[before].flags & FLUSH and not log.entries[behind].flags & FLUSH:
+                    self.after[before] = number
 
     def lost(self, flush, end, last):
         """The position of such a write that is missing, though its fsync had returned, when all up
-        to the flush is there and the power is cut at `end`: it is the first write after the flush,
-        and something is there that was written later (`last` is its position), or was told to the
-        world."""
-        entries = self.log.entries
-        for position in self.positions:
-            if position < flush or not entries[flush].flags & FLUSH or any(
-                    not entry.flags & MARK for entry in entries[flush + 1:position]):
-                continue
-            told = any(entry.flags & MARK for entry in entries[flush:min(position, end)])
-            if told or last is not None and last > position:
-                return position
-        return None
+        to the flush is there and the power is cut at `end`: something is there that was written
+        later (`last` is its position), or was told to the world."""
+        position = self.after.get(flush)
+        if position is None:
+            return None
+        told = any(entry.flags & MARK for entry in self.log.entries[flush:min(position, end)])
+        return position if told or last is not None and last > position else None
