@@ -1,6 +1,6 @@
-# Headers that most sources need and that take long to compile are precompiled in release builds and
-# under the sanitizers, which nobody works with from day to day. Other builds go without: there each
-# source must include what it uses.
+# Headers that most sources need and that take long to compile are precompiled in release builds,
+# under the sanitizers and for fuzz targets alone, which nobody works with from day to day. Other
+# builds go without: there each source must include what it uses.
 #
 # tavrel_precompiled_headers(NAME HEADERS <header>... [LINK target...] [OPTIONS target])
 #
@@ -8,7 +8,8 @@
 # named). Libraries and tests below the calling folder use them.
 function(tavrel_precompiled_headers name)
   cmake_parse_arguments(ARG "" "OPTIONS" "HEADERS;LINK" ${ARGN})
-  if(NOT CMAKE_BUILD_TYPE STREQUAL Release AND NOT TAVREL_SANITIZE)
+  if(NOT CMAKE_BUILD_TYPE STREQUAL Release AND NOT TAVREL_SANITIZE
+      AND NOT (TAVREL_FUZZ AND NOT TAVREL_TESTS))
     return()
   endif()
   set(source ${CMAKE_CURRENT_BINARY_DIR}/${name}.cc)
