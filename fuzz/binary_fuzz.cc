@@ -5,8 +5,14 @@
 
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
+#include "plist_mutator.h"
 
 using namespace tavrel;
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t most, unsigned seed) {
+  return fuzz::mutatePropertyList(data, size, most, seed);
+}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const auto value = plist::readBinary(std::as_bytes(std::span(data, size)));

@@ -9,6 +9,7 @@
 #include "daemon/tasking.h"
 #include "platform/persisted_state.h"
 #include "platform/plist/coding.h"
+#include "plist_mutator.h"
 #include "tests/fakes/fake_platform.h"
 
 using namespace tavrel;
@@ -55,6 +56,11 @@ std::set<std::string> track(fakes::FakePlatform& fake) {
 }
 
 }  // namespace
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t most, unsigned seed) {
+  return fuzz::mutatePropertyList(data, size, most, seed);
+}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const auto payload = plist::read(std::as_bytes(std::span(data, size)));

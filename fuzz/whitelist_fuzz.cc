@@ -6,6 +6,7 @@
 #include "config/bh_config.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
+#include "plist_mutator.h"
 #include "tools/overlay/overlay_platform.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_model.h"
@@ -42,6 +43,11 @@ void compare(const BHConfig& config, const WhitelistModel& model,
 }
 
 }  // namespace
+
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t most, unsigned seed) {
+  return fuzz::mutatePropertyList(data, size, most, seed);
+}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   static LinuxPlatform device{DeviceRoot("/nonexistent")};
