@@ -6,6 +6,7 @@
 // Input: a byte that chooses; then up to three contents, with 0xFF between them.
 #include <array>
 
+#include "memory_tree.h"
 #include "platform/linux/device/desktop_entries.h"
 #include "platform/linux/device/ecc_events.h"
 #include "platform/linux/device/linux_system_version.h"

@@ -11,6 +11,7 @@
 #include "fleet/logs/limits.h"
 #include "fleet/sources/limits.h"
 #include "fleet/sources/sources.h"
+#include "memory_tree.h"
 #include "support.h"
 
 using namespace tavrel;

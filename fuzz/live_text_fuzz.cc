@@ -4,10 +4,10 @@
 //
 // Input: the number of a file and its content, followed by 0xFF; repeated.
 #include <array>
-#include <optional>
 #include <utility>
 #include <vector>
 
+#include "memory_tree.h"
 #include "platform/linux/live/kernel_text.h"
 #include "platform/linux/live/live_machine.h"
 #include "platform/report_protocol.h"
@@ -20,8 +20,10 @@ using fuzz::require;
 
 struct File {
   const char* path;
-  const char* content;  // when the input does not say
+  const char* content;  // when the input does not say; without any the file is not there
+  bool isSlow = false;  // read by a thread of its own, as a device may keep the reader waiting
 };
+constexpr LiveMachine::Options kPatient{10'000, 10'000};
 // New ones go to the end: inputs hold the numbers.
 constexpr File kFiles[] = {
     {"/proc/stat", ""},
@@ -48,27 +50,13 @@ constexpr File kFiles[] = {
     {"/sys/devices/system/edac/mc/mc0/ce_count", ""},
     {"/sys/devices/system/edac/mc/mc0/dimm0/dimm_label", ""},
     {"/sys/class/thermal/thermal_zone0/type", ""},
-    {"/sys/class/thermal/thermal_zone0/temp", "40000"},
-    {"/sys/class/hwmon/hwmon0/in0_input", "1"},
+    {"/sys/class/thermal/thermal_zone0/temp", "40000", true},
+    {"/sys/class/hwmon/hwmon0/in0_input", "1", true},
     {"/sys/class/hwmon/hwmon0/in0_label", ""},
     {"/sys/fs/cgroup/cgroup.controllers", ""},
     {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
     {"/sys/fs/cgroup/a.slice/cpu.stat", ""},
     {"/sys/fs/cgroup/a.slice/memory.current", ""},
-};
-
-// Files that have their content already are left alone: most do, from input to input.
-class Files {
- public:
-  void write(std::size_t file, const std::string& content) {
-    if (written_[file] == content) return;
-    tree.write(kFiles[file].path, content);
-    written_[file] = content;
-  }
-  fuzz::Tree tree;
-
- private:
-  std::array<std::optional<std::string>, std::size(kFiles)> written_;
 };
 
 // The bytes of the largest channel and the number of all.
@@ -100,21 +88,25 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   for (std::size_t i = 0; i < contents.size(); ++i)
     contents[i] = kFiles[i].content;
   std::size_t last = 0;
+  bool isPatient = false;
   while (!input.empty()) {
     last = input.byte() % contents.size();
     contents[last] = input.part();
+    isPatient = isPatient || kFiles[last].isSlow;
   }
-  static Files files;
-  for (std::size_t i = 0; i < contents.size(); ++i)
-    files.write(i, contents[i]);
+  fuzz::Tree tree;
+  for (std::size_t i = 0; i < contents.size(); ++i) {
+    if (i == last || !contents[i].empty()) tree.write(kFiles[i].path, contents[i]);
+  }
 
+  // The thread takes longer than all the rest: without patience there is none.
   fuzz::SilentLog log;
-  LiveMachine machine(files.tree.root, log);
+  LiveMachine machine(tree.root, log, isPatient ? kPatient : LiveMachine::Options{0, 0});
   const auto sampling = machine.subscribe();
   const auto [largest, count] = subscribe(machine, *sampling);
   std::vector<std::byte> room(largest);
   for (const bool isEmptied : {false, true}) {
-    if (isEmptied) files.write(last, "");
+    if (isEmptied) tree.write(kFiles[last].path, "");
     sampling->update();
     for (std::size_t i = 0; i < count; ++i) {
       const std::size_t written = sampling->write(i, room);

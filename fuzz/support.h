@@ -1,18 +1,12 @@
-// What targets share that play files of a device: a log that nobody reads, and a tree of
-// files that holds nothing of earlier inputs.
+// What targets share: the bytes of the input, one part after another, and a log that nobody reads.
 #pragma once
 
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
-#include <filesystem>
-#include <fstream>
 #include <string>
 #include <string_view>
-#include <system_error>
 
 #include "base/bytes.h"
-#include "platform/linux/files/device_root.h"
 #include "platform/system_log.h"
 #include "require.h"
 
@@ -59,33 +53,6 @@ class Input {
 
  private:
   std::string_view rest_;
-};
-
-/// A device root in memory. It is removed with the object, so that an input never sees what an
-/// earlier one has left.
-class Tree {
- public:
-  Tree() {
-    require(mkdtemp(folder_.data()) != nullptr);
-    root = DeviceRoot(folder_);
-  }
-  ~Tree() {
-    std::error_code ignored;
-    std::filesystem::remove_all(folder_, ignored);
-  }
-  Tree(const Tree&) = delete;
-  Tree& operator=(const Tree&) = delete;
-
-  void write(std::string_view path, std::string_view content) {
-    const std::filesystem::path file = root.path(path);
-    std::filesystem::create_directories(file.parent_path());
-    std::ofstream(file, std::ios::binary) << content;
-  }
-
-  DeviceRoot root{"/"};
-
- private:
-  std::string folder_ = "/dev/shm/tavrel-fuzz-XXXXXX";
 };
 
 }  // namespace tavrel::fuzz
