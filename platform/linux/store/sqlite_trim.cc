@@ -163,7 +163,8 @@ std::int64_t SqliteTrim::removeDistributions(std::int32_t day, std::int64_t budg
                          "SELECT key, count, runs FROM distributions WHERE day = ?1 ORDER BY key");
     next.bind(1, day);
     for (std::int64_t work = 0; work < budget && next.step(); ++work) {
-      Row& row = rows.emplace_back(std::string(next.bytes(0)), next.integer(1));
+      rows.push_back({std::string(next.bytes(0)), next.integer(1), {}});
+      Row& row = rows.back();
       auto runs = unpackRuns(next.bytes(2));
       // What a damaged row refers to may belong to another.
       if (runs && valuesIn(*runs) == row.count) row.runs = *std::move(runs);
