@@ -399,25 +399,6 @@ TEST_F(Recording, AnExecutedProgramIsNoWriter) {
   waitFor(child);
 }
 
-TEST_F(Recording, AForkedChildThatExecutesRecordsForItself) {
-  run([&] {
-    add(1);
-    const pid_t child = start([] {
-      add(10);
-      execlp("sh", "sh", "-c", (TAVREL_BUILD "/bin/tavrelctl stat add count 100"), nullptr);
-    });
-    EXPECT_EQ(waitFor(child), 0);
-    add(1000);
-  });
-  EXPECT_EQ(segments().size(), 3U);
-  testClock().realtime = 0;
-  fold();
-  std::int64_t sum = 0;
-  for (const auto& [keyAndDay, value] : scalars)
-    sum += value;
-  EXPECT_EQ(sum, 1111);
-}
-
 TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
   const Descriptor own(open("/proc/self/ns/pid", O_RDONLY | O_CLOEXEC));
   if (unshare(CLONE_NEWPID) != 0) GTEST_SKIP() << "may not make a PID namespace";

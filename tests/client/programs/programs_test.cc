@@ -1,5 +1,5 @@
 // The other ways to record: the tool, Python and StatsD.
-#include "recording.h"
+#include "tests/client/recording.h"
 
 namespace tavrel {
 namespace {
@@ -114,6 +114,24 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   EXPECT_EQ(outputOf(once), "");
   EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=15");
   EXPECT_TRUE(outputOf(once + " --state " + root.string(), 1).ends_with("Is a directory\n"));
+}
+
+TEST_F(Programs, AForkedChildThatExecutesRecordsForItself) {
+  run([&] {
+    add(1);
+    const pid_t child = start([] {
+      add(10);
+      execlp("sh", "sh", "-c", (TAVREL_BUILD "/bin/tavrelctl stat add count 100"), nullptr);
+    });
+    EXPECT_EQ(waitFor(child), 0);
+    add(1000);
+  });
+  EXPECT_EQ(segments().size(), 3U);
+  fold();
+  std::int64_t sum = 0;
+  for (const auto& [keyAndDay, value] : scalars)
+    sum += value;
+  EXPECT_EQ(sum, 1111);
 }
 
 TEST_F(Programs, PythonRecords) {

@@ -1,4 +1,4 @@
-#include "recording.h"
+#include "tests/client/recording.h"
 
 namespace tavrel {
 namespace {
@@ -40,6 +40,28 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
       "1\n");  // the name of the version
   EXPECT_EQ(outputOf("readelf -d " + library + " | grep -c 'libstdc++\\|libm\\.\\|libgcc' || true"),
             "0\n");
+}
+
+TEST_F(Recording, ProgramsOfAnotherCLibraryRecord) {
+  if (std::system("command -v musl-gcc >/dev/null") != 0) GTEST_SKIP() << "no musl-gcc";
+  const std::string to = root / "musl";
+  // It comes without the kernel's headers.
+  outputOf("mkdir " + to + " && ln -s /usr/include/linux /usr/include/asm-generic " + to +
+           " && ln -s /usr/include/$(cc -print-multiarch)/asm " + to);
+  outputOf(
+      "musl-gcc -static -std=c11 -Wall -Wextra -Wpedantic -Werror -D_GNU_SOURCE"
+      " -DBRIMHOLD_BUILD_DAY=20000 -isystem " +
+      to +
+      " -I " TAVREL_SOURCE "/client/include " TAVREL_SOURCE "/client/*.c " TAVREL_EXAMPLES
+      "/record/record.c -o " +
+      to + "/record");
+  EXPECT_EQ(outputOf(to + "/record && " + to + "/record"), "");
+  testClock().realtime = 0;
+  fold();
+  ASSERT_EQ(scalars.size(), 1U);
+  EXPECT_EQ(scalars.begin()->second, 2);
+  EXPECT_EQ(records["com.example.seconds"], std::vector<double>(2, 2.5));
+  EXPECT_TRUE(segments().empty());
 }
 
 TEST_F(Recording, InstalledUnitsNameTheirPrograms) {
