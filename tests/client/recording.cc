@@ -109,6 +109,7 @@ void Recording::fold() {
       std::filesystem::remove(path);
     } else if (!isGone) {
       const Descriptor writable(open(path.c_str(), O_WRONLY));
+      if (!writable && errno == ENOENT) continue;
       ASSERT_TRUE(acknowledge(writable.get(), progress));
     }
   }

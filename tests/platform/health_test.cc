@@ -339,7 +339,7 @@ TEST_F(HealthReaderTest, AKilledReaderTellsNoGrowthTwice) {
   for (const unsigned day : {2U, 3U, 4U}) {
     run(day);
     put(*answers.smart, 48, {day + 1});
-    EXPECT_THROW(readAll(day * 1000), std::bad_alloc);
+    EXPECT_THROW(readAll(1000 + day), std::bad_alloc);
     EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000) << day;
   }
   answers.killer = "none";

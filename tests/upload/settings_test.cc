@@ -32,7 +32,8 @@ TEST(Upload, HasADeadlineForEverything) {
   };
   for (const int milliseconds : {0, -1})
     EXPECT_EQ(put(silent.url(), milliseconds).error().message, "no time is left");
-  EXPECT_THROW(put(std::string(9'000'000, 'x'), 1000), std::runtime_error) << "libcurl refuses it";
+  const std::string tooLong(8'100'000, 'x');  // libcurl refuses it
+  EXPECT_THROW(static_cast<void>(put(tooLong, 1000)), std::runtime_error);
   device.configuration.stall = seconds(60);
   for (auto* const limit : {&device.configuration.transfer, &device.configuration.run}) {
     *limit = seconds(1);
