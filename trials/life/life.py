@@ -371,7 +371,7 @@ class Life:
         lacks, more = sorted(set(wanted) - set(found)), sorted(set(found) - set(wanted))
         expect(sorted(found) == sorted(wanted), f"statistics lack {lacks[:9]} and have {more[:9]}")
         self.count("comparisons of the store")
-        self.count("of these, while values waited for a date", bool(twin.waiting))
+        self.count("comparisons of the store while values waited for a date", bool(twin.waiting))
         self.count("values compared in the store", len(found))
 
     def exported(self):
