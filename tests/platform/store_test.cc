@@ -105,7 +105,7 @@ class StoreTest : public testing::Test, protected DeviceServices {
   std::unique_ptr<SqliteStore> store_ = open();
 };
 
-TEST_F(StoreTest, AWalkEndsWhateverTheDaysAre) {
+TEST_F(StoreTest, WalksAndErasuresEndWhateverTheDaysAre) {
   set({{"a", kToday, 1}});
   // As a damaged page may have it.
   sql("DROP TABLE scalars;"
@@ -119,6 +119,11 @@ TEST_F(StoreTest, AWalkEndsWhateverTheDaysAre) {
         rows.push_back({std::string(key), day, value});
       }));
   EXPECT_EQ(rows, (Rows{{"a", 3, 4}}));
+
+  sql("INSERT INTO scalars VALUES ('7', x'61', 5), (x'08', x'61', 6)");
+  EXPECT_EQ(*(*history)->days(), (std::vector<std::int32_t>{0, 1, 3}));
+  ASSERT_TRUE(store_->erase({"", 0, 9}));
+  EXPECT_EQ(*(*history)->days(), (std::vector<std::int32_t>{1}));
 }
 
 TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {

@@ -31,11 +31,13 @@ std::string statement(std::string_view before, std::string_view table, std::stri
   return sql;
 }
 
-/// The first day from `day` on that has a row.
+/// The first day from `day` on that has a row. Texts and bytes, which damage may leave there, are
+/// not days.
 std::optional<std::int64_t> nextDay(SqliteConnection& connection, std::string_view table,
                                     std::int64_t day) {
-  SqliteStatement rows(
-      connection, statement("SELECT day FROM ", table, " WHERE day >= ?1 ORDER BY day LIMIT 1"));
+  SqliteStatement rows(connection,
+                       statement("SELECT day FROM ", table,
+                                 " WHERE day BETWEEN ?1 AND 2147483647 ORDER BY day LIMIT 1"));
   rows.bind(1, day);
   if (!rows.step()) return std::nullopt;
   return rows.integer(0);

@@ -48,16 +48,18 @@ struct SqliteTrim::Row {
 std::vector<std::int32_t> daysIn(SqliteConnection& connection) {
   std::vector<std::int32_t> days;
   for (const char* table : {"scalars", "distributions"}) {
+    // Damage, or a writer other than ours, may put days there that are beyond 32 bits, have
+    // fractions, or are no numbers; the last come after all numbers.
     SqliteStatement next(connection, std::string("SELECT day FROM ") + table +
-                                         " WHERE day > ?1 ORDER BY day LIMIT 1");
+                                         " WHERE day BETWEEN ?1 AND 2147483647"
+                                         " ORDER BY day LIMIT 1");
     std::vector<std::int32_t> found;
-    for (std::int64_t day = std::int64_t{INT32_MIN} - 1;;) {
-      next.bind(1, day);
+    for (std::int64_t wanted = INT32_MIN;;) {
+      next.bind(1, wanted);
       if (!next.step()) break;
-      day = next.integer(0);
-      // Only a writer other than ours could have put a day beyond 32 bits there.
-      if (day > INT32_MAX) break;
+      const std::int64_t day = next.integer(0);
       found.push_back(static_cast<std::int32_t>(day));
+      wanted = day + 1;
       next.reset();
     }
     next.reset();
