@@ -1,29 +1,76 @@
-// Log pages, registers, texts of sysfs, readings and remembered counters. The first byte chooses.
-#include <cstdint>
-#include <string_view>
-
+// Log pages, registers, texts of sysfs, readings and remembered counters. What is read and written
+// again reads back, and only counters grow beyond what was remembered.
+//
+// Input: a byte that chooses, then the bytes.
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/growth.h"
 #include "platform/linux/health/nvme_logs.h"
 #include "platform/linux/health/reading.h"
 #include "platform/linux/health/verdict.h"
+#include "plist_mutator.h"
+#include "require.h"
+
+using namespace tavrel;
+using namespace tavrel::health;
+using fuzz::require;
 
 namespace {
 
-void judgeAll(tavrel::health::Figures figures) {
-  tavrel::health::Reading reading;
+constexpr unsigned kReading = 4;
+
+void judgeAll(Figures figures) {
+  Reading reading;
   reading.figures = std::move(figures);
-  tavrel::health::judge(reading, 0, "");
-  tavrel::health::figuresOf({reading});
+  judge(reading, 0, "");
+  figuresOf({reading});
+}
+
+void readReading(ByteSpan bytes) {
+  const auto reading = decodeReading(bytes);
+  if (!reading) return require(!reading.error().message.empty());
+  judge(*reading, 0, "");
+  figuresOf({*reading});
+  const auto document = encodeReading(*reading);
+  if (!document) return;  // its time is beyond the calendar
+  const auto again = decodeReading(asBytes(*document));
+  require(again && again->figures.size() == reading->figures.size());
+  const auto second = encodeReading(*again);
+  require(second && *second == *document);
+}
+
+void readMemory(ByteSpan bytes) {
+  auto memory = decodeMemory(bytes);
+  if (!memory) return require(!memory.error().message.empty());
+  if (const auto document = encodeMemory(*memory)) {
+    const auto again = decodeMemory(asBytes(*document));
+    require(again && again->drives.size() == memory->drives.size());
+    const auto second = encodeMemory(*again);
+    require(second && *second == *document);
+  }
+  Figures figures;
+  for (const FigureKind& kind : nvmeSmartKinds())
+    figures.push_back({&kind, 1'000});
+  for (auto& [identity, drive] : memory->drives) {
+    for (const std::int64_t day : {20'000, 20'001}) {
+      for (const Figure& grown : takeGrowth(drive, figures, {day * 86'400, "boot", day}))
+        require(grown.kind->course != Course::Gauge && drive.last.contains(grown.kind->name));
+    }
+  }
+  memory->forgetOld(20'001 * std::int64_t{86'400});
 }
 
 }  // namespace
 
+extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
+                                               std::size_t most, unsigned seed) {
+  if (size < 2 || data[0] % 6 < kReading) return LLVMFuzzerMutate(data, size, most);
+  return 1 + fuzz::mutatePropertyList(data + 1, size - 1, most - 1, seed);
+}
+
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  using namespace tavrel::health;
   if (size == 0) return 0;
-  const tavrel::ByteSpan bytes = std::as_bytes(std::span(data + 1, size - 1));
-  const std::string_view text = tavrel::asText(bytes);
+  const ByteSpan bytes = std::as_bytes(std::span(data + 1, size - 1));
+  const std::string_view text = asText(bytes);
   switch (data[0] % 6) {
     case 0:
       if (auto figures = nvmeSmartFigures(bytes)) judgeAll(std::move(*figures));
@@ -41,19 +88,11 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       judgeAll(emmcFigures(text, text));
       judgeAll(ufsFigures(text, text, text));
       break;
-    case 4:
-      if (const auto reading = decodeReading(bytes)) {
-        if (const auto document = encodeReading(*reading)) {
-          if (!decodeReading(tavrel::asBytes(*document))) __builtin_trap();
-        }
-      }
+    case kReading:
+      readReading(bytes);
       break;
     default:
-      if (const auto memory = decodeMemory(bytes)) {
-        if (const auto document = encodeMemory(*memory)) {
-          if (!decodeMemory(tavrel::asBytes(*document))) __builtin_trap();
-        }
-      }
+      readMemory(bytes);
   }
   return 0;
 }
