@@ -2,8 +2,9 @@
 // data. A reading says what it was read from or why there is none, labels are printable, and what
 // was written reads back.
 //
-// Input: a byte that chooses SMART data alone or the machine; then the attributes of SMART data, or
-// numbers of attributes with contents, 0xFF behind each, and the drives' answer at the end.
+// Input: a byte that chooses SMART data alone or the machine, and drives that it lacks; then the
+// attributes of SMART data, or numbers of attributes with contents, 0xFF behind each, and the
+// drives' answer at the end.
 #include <dlfcn.h>
 #include <map>
 #include <optional>
@@ -97,10 +98,10 @@ void readSmart(std::string_view blob) {
   figuresOf({reading});
 }
 
-void readMachine(fuzz::Input& input) {
+void readMachine(fuzz::Input& input, unsigned without) {
   fuzz::Tree tree;
-  tree.write("/sys/block/mmcblk0/device/type", "MMC");
-  tree.write("/sys/block/sda/device/vendor", "ATA");
+  if ((without & 1) == 0) tree.write("/sys/block/mmcblk0/device/type", "MMC");
+  if ((without & 2) == 0) tree.write("/sys/block/sda/device/vendor", "ATA");
   for (int i = 0; i < 4 && !input.empty(); ++i) {
     const std::string_view path = kAttributes[input.byte() % std::size(kAttributes)];
     tree.write(path, input.part());
@@ -144,7 +145,8 @@ extern "C" void regfree(regex_t*) {}
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
-  switch (input.byte() % 4) {
+  const unsigned choice = input.byte();
+  switch (choice % 4) {
     case 0:
       readSmart(input.text());
       break;
@@ -152,7 +154,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       readSmart(smartData(input.text()));
       break;
     default:
-      readMachine(input);
+      readMachine(input, choice / 4);
   }
   return 0;
 }
