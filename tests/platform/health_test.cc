@@ -267,9 +267,14 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
   write("/sys/class/mtd/mtd0/ecc_failures", "2\n");
   write("/sys/class/mtd/mtd0/corrected_bits", "-\n");
   write("/sys/class/ubi/ubi0/max_ec", "9\n");
+  write("/sys/class/ubi/ubi0/mtd_num", "7\n");
+  write("/sys/class/ubi/ubi1/mtd_num",
+        "a text as long as labels may be, which is 64 bytes and no more..");
   ASSERT_TRUE(readAll(1000));
   auto all = readings();
-  ASSERT_EQ(all.size(), 4U);
+  ASSERT_EQ(all.size(), 5U);
+  EXPECT_EQ(all["ubi0"].model, "mtd7");
+  EXPECT_EQ(all["ubi1"].model, "mtd");
   EXPECT_EQ(all["nvme0"].capacity, 2048 * 512);
   EXPECT_EQ(all["nvme0"].time, 1000);
   EXPECT_EQ(valuesOf(all["nvme0"].figures)["written"], 1'024'000);

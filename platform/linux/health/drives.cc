@@ -111,13 +111,14 @@ void addRawFlash(const Machine& machine, std::vector<Drive>& drives) {
     if (!isNumbered(name, "ubi")) continue;
     const auto blocks = readNumber(folder + "/total_eraseblocks");
     const auto size = readNumber(folder + "/eraseblock_size");
+    const auto device = readNumber(folder + "/mtd_num");
     std::int64_t bytes = 0;
     const bool isKnown = blocks && size && !__builtin_mul_overflow(*blocks, *size, &bytes);
     drives.push_back({name,
                       DriveKind::Ubi,
                       folder,
                       {},
-                      "mtd" + readLabel(folder + "/mtd_num"),
+                      device ? "mtd" + std::to_string(*device) : "mtd",
                       {},
                       {},
                       isKnown ? std::optional(bytes) : std::nullopt});
