@@ -203,6 +203,9 @@ int fsync(int descriptor) {
   return onDescriptor(descriptor, succeed,
                       [&] { return static_cast<int>(syscall(SYS_fsync, descriptor)); });
 }
+int fdatasync(int descriptor) {
+  return fsync(descriptor);
+}
 int flock(int descriptor, int operation) noexcept {
   return onDescriptor(descriptor, succeed,
                       [&] { return static_cast<int>(syscall(SYS_flock, descriptor, operation)); });
