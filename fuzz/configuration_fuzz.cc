@@ -1,0 +1,185 @@
+// Files of settings and memory, and addresses. They are refused in one line or read into what their
+// bounds allow, and what a program remembers reads back as it was written.
+//
+// Input: a byte that chooses the file; a byte, which when it is odd has the property list made of
+// what follows; the content.
+#include <algorithm>
+#include <vector>
+
+#include "base/limits.h"
+#include "memory_tree.h"
+#include "platform/linux/device/ecc_events.h"
+#include "platform/linux/device/file_device_answers.h"
+#include "platform/linux/device/linux_system_controls.h"
+#include "platform/linux/device/linux_system_version.h"
+#include "platform/linux/folding/fold_notes.h"
+#include "platform/linux/folding/recorders.h"
+#include "platform/linux/limits/device_limits.h"
+#include "platform/linux/runs/last_run.h"
+#include "platform/plist/coding.h"
+#include "reporting_values.h"
+#include "support.h"
+#include "upload/configuration.h"
+#include "upload/state.h"
+
+using namespace tavrel;
+using fuzz::require;
+
+namespace {
+
+constexpr std::string_view kKeys[] = {"Store",
+                                      "Pending",
+                                      "Days",
+                                      "Bytes",
+                                      "Refused",
+                                      "com.norvane.",
+                                      "0",
+                                      "4294967295",
+                                      "root",
+                                      "URL",
+                                      "ConnectSeconds",
+                                      "RunSeconds",
+                                      "AllowPlainHTTP",
+                                      "NeedsDefaultRoute",
+                                      "MeteredInterfaces",
+                                      "ProductName",
+                                      "ProductVersion",
+                                      "ProductBuildVersion",
+                                      "vm.swapusage",
+                                      "errno",
+                                      "DiskUsage",
+                                      "Time",
+                                      "Task",
+                                      "Day",
+                                      "Finished",
+                                      "Errors",
+                                      "ErrorCount",
+                                      "Process",
+                                      "Boot",
+                                      "LastAttempt",
+                                      "NextAttempt",
+                                      "FailedAttempts",
+                                      "Sent",
+                                      "Failure"};
+
+struct Device : fuzz::Tree {
+  fuzz::SilentLog log;
+  FileSystem files;
+  plist::PlistCoding coding;
+};
+
+void requireLine(const Error& error) {
+  require(!error.message.empty());
+}
+
+void readLimits(Device& device) {
+  const auto limits = DeviceLimits::read(device.root, device.files, device.coding);
+  if (!limits) return requireLine(limits.error());
+  for (const KeptKind& kind : kKeptKinds)
+    require(limits->of(kind.kind).days >= 1 && limits->of(kind.kind).bytes >= 64 << 10);
+}
+
+void readRecorders(Device& device) {
+  const auto recorders = Recorders::read(device.root, device.files, device.coding, device.log);
+  for (const std::string_view key : {"", "a", "com.norvane.usage.x", "com.example.starts"}) {
+    require(recorders.mayRecord(0, key));
+    for (const std::uint32_t user : {1U, 1000U, UINT32_MAX})
+      recorders.mayRecord(user, key);
+  }
+}
+
+void readUpload(Device& device) {
+  const auto configuration =
+      upload::readConfiguration(device.root, device.files, device.coding, device.root.path("/c"));
+  if (!configuration) return requireLine(configuration.error());
+  require(!configuration->url.ends_with('/') && !configuration->host.empty());
+  require(configuration->run.count() >= 1 &&
+          configuration->run.count() <= limits::kLongestUploadPauseSeconds);
+}
+
+void readSystem(Device& device) {
+  LinuxSystemVersion version(device.root, device.files, device.coding, device.log);
+  for (const plist::Entry& entry : version.systemVersionDictionary())
+    require(entry.value.string().has_value());
+  require(!version.text().empty());
+  FileDeviceAnswers(device.root, device.files, device.coding, device.log).SQCopyAnswer("DiskUsage");
+  EccEvents events(device.root, device.files, device.coding, device.log, EccEvents::Mode::Peek);
+  LinuxSystemControls controls(device.root, device.files, device.coding, device.log, events);
+  for (std::size_t size = 0; size <= 9; ++size) {
+    std::vector<std::byte> buffer(size);
+    const auto result = controls.read("vm.swapusage", buffer);
+    require(result.length <= size && (result.errorNumber == 0 || result.length == 0));
+  }
+}
+
+void readMemory(Device& device) {
+  if (const auto run = LastRun::read(device.root, device.files); run && *run) {
+    require((*run)->errors.size() <= LastRun::kErrors);
+    if ((*run)->write(device.root, device.files)) {
+      const auto again = LastRun::read(device.root, device.files);
+      require(again && *again && (*again)->task == (*run)->task &&
+              (*again)->errors == (*run)->errors && (*again)->day == (*run)->day);
+    }
+  }
+  const std::string path = device.root.path(upload::kStatePath);
+  const auto state = upload::readState(device.files, device.coding, device.log, path);
+  require(state.sent >= 0 && state.refused >= 0 && state.failedAttempts >= 0);
+  require(upload::pauseSeconds(state.failedAttempts, state.sent, 1.0) <=
+          static_cast<double>(limits::kLongestUploadPauseSeconds));
+  if (!upload::writeState(device.files, device.coding, path, state)) return;
+  const auto again = upload::readState(device.files, device.coding, device.log, path);
+  require(again.sent == state.sent && again.failure == state.failure);
+}
+
+void readNotes(Device& device, std::string_view content) {
+  device.write("/run/tavrel/fold.lock", content);
+  auto notes = FoldNotes::lock(device.root, device.files, device.log);
+  require(static_cast<bool>(notes));
+  const bool isNew = notes->tell("a line");
+  require(!isNew || !notes->tell("a line"));
+  notes->save();
+}
+
+}  // namespace
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  fuzz::Input input(data, size);
+  const unsigned choice = input.byte();
+  const bool isMade = input.byte() % 2 != 0;
+  std::string content(input.text());
+  if (isMade) {
+    fuzz::ValueReader values(input.bytes(), kKeys);
+    const auto document = plist::PlistCoding().encodeXml(values.dictionary(0));
+    if (!document) return 0;
+    content = *document;
+  }
+  Device device;
+  switch (choice % 6) {
+    case 0:
+      device.write(kLimitsPath, content);
+      readLimits(device);
+      break;
+    case 1:
+      device.write("/etc/tavrel/recorders.plist", content);
+      readRecorders(device);
+      break;
+    case 2:
+      if (choice / 6 % 2 != 0) device.write("/c/tavrel-upload.token", content.substr(0, 40));
+      device.write(upload::kConfigurationPath, content);
+      readUpload(device);
+      break;
+    case 3:
+      for (const std::string name : {"system-version", "device-answers", "system-controls"})
+        device.write("/etc/tavrel/" + name + ".plist", content);
+      readSystem(device);
+      break;
+    case 4:
+      device.write(kLastRunFile, content);
+      device.write(upload::kStatePath, content);
+      readMemory(device);
+      break;
+    default:
+      readNotes(device, content);
+  }
+  return 0;
+}
