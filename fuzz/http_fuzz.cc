@@ -1,12 +1,13 @@
-// What servers answer, over a real connection: to the uploader, and, as rows, to the fleet's
+// What servers answer, through all of libcurl: to the uploader, and, as rows, to the fleet's
 // questions; and the headers in which a log's metadata travels. Numbers from headers stay within
 // their bounds, and texts on one line. Rows are the same in whatever pieces they arrive. What a
 // header says of a log's versions, the fleet reads back.
 //
 // Input: a byte that chooses, then the answer, the rows, or a property list.
-#include <arpa/inet.h>
+#include <array>
+#include <cerrno>
+#include <map>
 #include <optional>
-#include <poll.h>
 #include <sys/socket.h>
 #include <vector>
 
@@ -25,36 +26,31 @@ using fuzz::require;
 
 namespace {
 
-/// Answers each request at a port of this machine with the same bytes, and ends the connection. It
-/// works while libcurl waits, in the same thread: handing over to another would take far longer
-/// than all the rest.
+/// Answers each connection with the same bytes, and ends it. What libcurl takes for TCP is a pair
+/// of sockets, whose other end is here: the network of the kernel takes far longer than all the
+/// rest.
 class AnsweringServer {
  public:
-  AnsweringServer() : listener_(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC | SOCK_NONBLOCK, 0)) {
-    sockaddr_in address{AF_INET, 0, {htonl(INADDR_LOOPBACK)}, {}};
-    socklen_t size = sizeof address;
-    auto* const plain = reinterpret_cast<sockaddr*>(&address);
-    require(bind(listener_.get(), plain, size) == 0 && listen(listener_.get(), 16) == 0);
-    require(getsockname(listener_.get(), plain, &size) == 0);
-    url = "http://127.0.0.1:" + std::to_string(ntohs(address.sin_port)) + "/";
-  }
   void answerWith(std::string answer) {
     peers_.clear();
     answer_ = std::move(answer);
   }
-  void serve() {
-    while (Descriptor peer{accept4(listener_.get(), nullptr, nullptr, SOCK_CLOEXEC)}) {
-      send(peer.get(), answer_.data(), answer_.size(), MSG_NOSIGNAL);
-      shutdown(peer.get(), SHUT_WR);
-      peers_.push_back(std::move(peer));
-    }
+  int makeSocket(int type) {
+    std::array<int, 2> ends{};
+    if (socketpair(AF_UNIX, type, 0, ends.data()) != 0) return -1;
+    peers_[ends[0]] = Descriptor(ends[1]);
+    return ends[0];
   }
-  std::string url;
+  int connectFrom(int client) {
+    const int peer = peers_.at(client).get();
+    send(peer, answer_.data(), answer_.size(), MSG_NOSIGNAL);
+    return shutdown(peer, SHUT_WR);
+  }
+  const std::string url = "http://127.0.0.1:80/";
 
  private:
-  Descriptor listener_;
   std::string answer_;
-  std::vector<Descriptor> peers_;
+  std::map<int, Descriptor> peers_;  // by the client's end
 };
 
 AnsweringServer& theServer() {
@@ -181,11 +177,17 @@ void sendMetadata(ByteSpan document) {
 
 }  // namespace
 
-// libcurl's.
-extern "C" int poll(pollfd* files, nfds_t count, int milliseconds) {
-  theServer().serve();
-  const timespec longest{milliseconds / 1000, milliseconds % 1000 * 1'000'000L};
-  return ppoll(files, count, milliseconds < 0 ? nullptr : &longest, nullptr);
+// For libcurl.
+extern "C" int socket(int domain, int type, int) noexcept {
+  if (domain == AF_INET) return theServer().makeSocket(type);
+  errno = EAFNOSUPPORT;
+  return -1;
+}
+extern "C" int connect(int socket, const sockaddr*, socklen_t) {
+  return theServer().connectFrom(socket);
+}
+extern "C" int setsockopt(int, int, int, const void*, socklen_t) noexcept {
+  return 0;
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
