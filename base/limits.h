@@ -79,6 +79,10 @@ inline constexpr std::size_t kSegmentFolderEntries = 1'000'000;
 inline constexpr std::size_t kSegmentsPerUser = 2'048;
 inline constexpr std::size_t kSegments = 16'384;
 
+/// Bytes of the positions of one user's segments in the store. A program with fifty scalars takes
+/// one KiB. Segments whose positions would need more wait.
+inline constexpr std::size_t kPositionBytesPerUser = 1U << 20;
+
 /// Measurements that a fold takes from one user and in all; the segments that are left then wait
 /// for the next fold. Segments of 200,000 each that programs fill in an hour stay below.
 inline constexpr std::uint64_t kFoldValuesPerUser = 16'000'000;

@@ -727,6 +727,31 @@ TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurn) {
   EXPECT_EQ(scalar("count"), kSegments);
 }
 
+TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
+  run([] { add(1); });
+  std::array<std::byte, 256> head;
+  SegmentFile(Descriptor(open(segments().at(0).c_str(), O_RDONLY | O_CLOEXEC)).get()).read(0, head);
+  std::filesystem::remove(segments().at(0));
+  const std::uint32_t cellsUsed = kBHCellCount;
+  // Cells that an earlier store took: nothing but their position is new.
+  std::string cells(std::size_t{kBHCellCount} * kBHCellBytes, '\1');
+  std::vector<Descriptor> writers;
+  for (std::uint64_t number = 1; number <= 9; ++number) {
+    storeLittle64(head, kBHHeaderIdentity, number);
+    const auto path = folder / (std::to_string(number) + ".segment");
+    writers.emplace_back(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
+    const int file = writers.back().get();
+    ASSERT_EQ(ftruncate(file, kBHSegmentBytes), 0);
+    ASSERT_EQ(pwrite(file, head.data(), head.size(), 0), std::ssize(head));
+    ASSERT_EQ(pwrite(file, &cellsUsed, sizeof cellsUsed, kBHHeaderCellsUsed), 4);
+    ASSERT_EQ(pwrite(file, cells.data(), cells.size(), kBHCells), std::ssize(cells));
+  }
+  for (int fold = 0; fold < 2; ++fold)
+    EXPECT_EQ(foldNow().waiting, 3U);  // each position has 163,864 bytes, of 1 MiB
+  writers.clear();
+  EXPECT_EQ(foldNow().removed, 9U);
+}
+
 TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
   testClock().realtime = 1000;
   testClock().boot = 100;

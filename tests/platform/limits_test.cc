@@ -184,6 +184,9 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   // What is left is whole.
   EXPECT_EQ(sql("PRAGMA integrity_check"), Lines{"ok"});
   EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{std::to_string(left.size() * 6)});
+  // Positions of segments belong to no day.
+  sql("INSERT INTO segments VALUES (7, x'00', zeroblob(999999))");
+  EXPECT_EQ(tidy().kinds[0].removed, 0);
   limit({{"Store", plist::Dictionary{{"Days", 1}}}});
   tidy();
   EXPECT_EQ(daysHeld(), Days{kToday});

@@ -1,6 +1,7 @@
 #include "tools/consent/erase_command.h"
 
 #include <istream>
+#include <limits>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -96,12 +97,18 @@ bool isConfirmed(ToolContext& context, const Scope& scope, bool yes) {
   return false;
 }
 
-/// Moves what programs recorded into the store, however many folds that takes.
+/// Moves what programs recorded into the store, however many folds that takes. Fails when a fold
+/// leaves as much as the one before: that has to wait for something else.
 Status foldEverything(ToolContext& context) {
+  std::uint64_t before = std::numeric_limits<std::uint64_t>::max();
   while (true) {
     const FoldReport report = context.linuxPlatform().fold().run();
     if (report.failure) return Error{*report.failure};
-    if (report.waiting == 0 || report.segments == 0) return Done{};
+    if (report.waiting == 0) return Done{};
+    if (report.waiting >= before) {
+      return Error{counted(report.waiting, "segment") + " cannot be folded now"};
+    }
+    before = report.waiting;
   }
 }
 

@@ -92,8 +92,8 @@ void tidy(ToolContext& context, bool isQuiet) {
     }
     if (tidied.exceeds) {
       context.note(
-          format("%s: what is left exceeds the limits and stays, because it has not been "
-                 "reported yet",
+          format("%s: what is left exceeds the limits and stays: days that have not been reported "
+                 "yet, and what belongs to no day",
                  tidied.kind->label));
     }
   }

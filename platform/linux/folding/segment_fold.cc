@@ -55,6 +55,8 @@ class FoldRun {
                     const SegmentName& name, bool isWriterGone);
   Status dropPositions(SqliteBatch& batch);
   bool mustWait(const SegmentName& name);
+  Expected<bool> hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner, std::size_t before,
+                                    std::size_t most);
   void refuse(std::string_view line);
   void finishSegments();
 
@@ -68,6 +70,7 @@ class FoldRun {
   FoldedRows rows_;
   std::optional<SegmentNames> known_;               // whose positions the store holds
   std::map<std::uint32_t, std::size_t> positions_;  // of each user
+  std::map<std::uint32_t, std::int64_t> positionBytes_;
   SegmentNames found_;
   std::set<std::uint32_t> unseen_;    // users with segments whose identities are not known
   std::vector<SegmentName> removed_;  // whose positions would keep new segments waiting
@@ -195,6 +198,20 @@ bool FoldRun::mustWait(const SegmentName& name) {
   return ++positions_[name.owner] > limits::kSegmentsPerUser;
 }
 
+// The position of a segment may grow from `before` to `most` bytes.
+Expected<bool> FoldRun::hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner,
+                                           std::size_t before, std::size_t most) {
+  if (most <= before) return true;
+  auto known = positionBytes_.find(owner);
+  if (known == positionBytes_.end()) {
+    const auto bytes = batch.segmentPositionBytes(owner);
+    if (!bytes) return bytes.error();
+    known = positionBytes_.emplace(owner, *bytes).first;
+  }
+  return known->second + static_cast<std::int64_t>(most - before) <=
+         std::int64_t{limits::kPositionBytesPerUser};
+}
+
 Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
                            const SegmentName& name, bool isWriterGone) {
   SegmentPosition position;
@@ -220,6 +237,16 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     }
     return Done{};
   }
+  // Of a segment that nobody writes to, a mark is left, unless values wait for a date.
+  if (!isWriterGone || !boot_) {
+    const auto hasRoom =
+        hasRoomForPosition(batch, name.owner, before.size(), reader.positionBytes());
+    if (!hasRoom) return hasRoom.error();
+    if (!*hasRoom) {
+      ++report_.waiting;
+      return Done{};
+    }
+  }
   SegmentIntake intake(name.owner, recorders_, rows_, changes_, batch.waitingDistributions());
   SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
   if (Status done = reader.readable(); !done) return done;
@@ -229,6 +256,9 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   if (const std::string after = position.encode(); after != before) {
     if (Status done = batch.setSegmentPosition(name.owner, name.identity, after); !done) {
       return done;
+    }
+    if (const auto bytes = positionBytes_.find(name.owner); bytes != positionBytes_.end()) {
+      bytes->second += std::ssize(after) - std::ssize(before);
     }
   }
   if (!intake.foreignKey().empty() && toldUsers_.insert(name.owner).second) {

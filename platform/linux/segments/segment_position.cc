@@ -49,7 +49,7 @@ std::string SegmentPosition::encode() const {
   const std::uint32_t usedCells = countUsed(cells);
   const std::uint32_t usedChunks = countUsed(chunks);
   std::string out;
-  out.reserve(kHeadBytes + usedCells * kCellBytes + usedChunks * kChunkBytes);
+  out.reserve(bytesOf(usedCells, usedChunks));
   append(out, kVersion);
   append(out, usedCells);
   append(out, usedChunks);
@@ -72,6 +72,10 @@ std::string SegmentPosition::encode() const {
   return out;
 }
 
+std::size_t SegmentPosition::bytesOf(std::size_t cells, std::size_t chunks) {
+  return kHeadBytes + cells * kCellBytes + chunks * kChunkBytes;
+}
+
 Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
   const Error refused{"not the position of a segment"};
   const ByteSpan bytes = asBytes(text);
@@ -79,8 +83,7 @@ Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
   const std::uint32_t usedCells = loadLittle32(bytes, 4).value_or(0);
   const std::uint32_t usedChunks = loadLittle32(bytes, 8).value_or(0);
   if (loadLittle32(bytes, 0) != kVersion || usedCells > kBHCellCount ||
-      usedChunks > kBHChunkCount ||
-      bytes.size() != kHeadBytes + usedCells * kCellBytes + usedChunks * kChunkBytes) {
+      usedChunks > kBHChunkCount || bytes.size() != bytesOf(usedCells, usedChunks)) {
     return refused;
   }
   SegmentPosition position;

@@ -2,8 +2,9 @@
 // each is taken once.
 //
 // The bytes of a position hold only what was folded of the segment, 20 bytes per cell and 12 per
-// chunk, whatever its header claims: nobody fills the store with positions of empty segments. A
-// segment that was folded to its end, and to which nobody can write, needs no more than a mark.
+// chunk: what its header claims or a reader refuses takes nothing. A fold bounds the bytes of each
+// user's positions. A segment that was folded to its end, and to which nobody can write, needs no
+// more than a mark.
 #pragma once
 
 #include <cstdint>
@@ -41,6 +42,8 @@ struct SegmentPosition {
   bool operator==(const SegmentPosition&) const = default;
 
   std::string encode() const;
+  /// The bytes of a position with so many parts.
+  static std::size_t bytesOf(std::size_t cells, std::size_t chunks);
   /// Without unused parts at the ends. Refuses bytes that `encode` did not write.
   static Expected<SegmentPosition> decode(std::string_view bytes);
 };

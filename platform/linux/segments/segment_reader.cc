@@ -200,6 +200,18 @@ Expected<SegmentReader::State> SegmentReader::state() const {
   return State::Begun;
 }
 
+std::uint32_t SegmentReader::cellsUsed() const {
+  return std::min<std::uint32_t>(file_.word32(kBHHeaderCellsUsed), kBHCellCount);
+}
+
+std::uint32_t SegmentReader::chunksUsed() const {
+  return std::min<std::uint32_t>(file_.word32(kBHHeaderChunksUsed), kBHChunkCount);
+}
+
+std::size_t SegmentReader::positionBytes() const {
+  return SegmentPosition::bytesOf(cellsUsed(), chunksUsed());
+}
+
 SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                                     SegmentSink& sink) {
   Reading reading{position, boot, writerIsGone, sink, {}, {}};
@@ -208,8 +220,7 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
   reading.progress.nextFolds = file_.word64(kBHHeaderFolds) + 1;
   position.dropped = dropped;
   readCells(reading);
-  const std::uint32_t chunks =
-      std::min<std::uint32_t>(file_.word32(kBHHeaderChunksUsed), kBHChunkCount);
+  const std::uint32_t chunks = chunksUsed();
   if (position.chunks.size() < chunks) position.chunks.resize(chunks);
   for (std::uint32_t first = 0; first < chunks; first += kChunksAtOnce)
     readChunks(reading, first, std::min(kChunksAtOnce, chunks - first));
@@ -220,8 +231,7 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
 }
 
 void SegmentReader::readCells(Reading& reading) {
-  const std::uint32_t cells =
-      std::min<std::uint32_t>(file_.word32(kBHHeaderCellsUsed), kBHCellCount);
+  const std::uint32_t cells = cellsUsed();
   if (reading.position.cells.size() < cells) reading.position.cells.resize(cells);
   // Many at once, to see which hold something new.
   constexpr std::uint32_t kAtOnce = 64;
@@ -276,7 +286,9 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
       const std::int64_t time = isSet ? nanosecondsOf(now.setTime, reading.boot) : 0;
       reading.sink.takeScalar({*key, instant->day, isSet, value, time});
     } else {
+      // No honest program has such a cell: it is refused each time, and no store remembers it.
       ++reading.progress.refused;
+      return;
     }
   }
   folded = {now.sets, now.value};
@@ -347,7 +359,9 @@ void SegmentReader::takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t in
     reading.sink.takeRecord(
         {key, number, days.day(), days.secondInDay(), std::bit_cast<double>(bits)});
   }
-  reading.position.chunks[index] = {look.generation, look.ready};
+  reading.position.chunks[index] = look.ready == 0
+                                       ? SegmentPosition::Chunk{}
+                                       : SegmentPosition::Chunk{look.generation, look.ready};
   if (look.ready == kBHChunkRecords && !reading.writerIsGone &&
       look.acknowledged != look.generation) {
     reading.progress.acknowledgements.push_back({offset + kBHChunkAcknowledged, look.generation});

@@ -89,6 +89,9 @@ class SegmentReader {
   /// Fails when something that was looked at so far could not be read: it is not to be used then.
   Status readable() const;
 
+  /// The most bytes that a position has after a read of what the header says is used.
+  std::size_t positionBytes() const;
+
   /// Yields what came after `position`, and advances it. `writerIsGone` says what was known before
   /// the call (see `segment_writer.h`): if true, records after an unfinished one are read too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
@@ -98,6 +101,8 @@ class SegmentReader {
   struct Reading;
   struct ChunkLook;
 
+  std::uint32_t cellsUsed() const;
+  std::uint32_t chunksUsed() const;
   void readCells(Reading& reading);
   void readCell(Reading& reading, std::uint32_t index);
   void readChunks(Reading& reading, std::uint32_t first, std::uint32_t count);

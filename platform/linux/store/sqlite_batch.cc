@@ -233,6 +233,15 @@ Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
   }
 }
 
+Expected<std::int64_t> SqliteBatch::segmentPositionBytes(std::uint32_t owner) {
+  try {
+    begin();
+    return segment_table::positionBytes(connection_, owner);
+  } catch (const StoreFailure& failure) {
+    return fail(failure);
+  }
+}
+
 Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity identity,
                                        std::string_view position) {
   try {

@@ -63,6 +63,8 @@ class SqliteBatch {
                                                        std::span<const std::byte, 16> identity);
   /// The segments whose positions the store holds, by owner and then by identity.
   Expected<std::vector<SegmentName>> segmentNames();
+  /// Bytes of the positions of one user's segments.
+  Expected<std::int64_t> segmentPositionBytes(std::uint32_t owner);
   Status setSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity,
                             std::string_view position);
   Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);

@@ -36,6 +36,17 @@ std::vector<SegmentName> names(SqliteConnection& connection) {
   return found;
 }
 
+std::int64_t positionBytes(SqliteConnection& connection, std::uint32_t owner) {
+  SqliteStatement sum(connection,
+                      "SELECT ifnull(sum(length(position)), 0) FROM segments WHERE owner = ?1");
+  sum.bind(1, std::int64_t{owner});
+  return sum.step() ? sum.integer(0) : 0;
+}
+
+std::int64_t positionBytes(SqliteConnection& connection) {
+  return connection.integer("SELECT ifnull(sum(length(position)), 0) FROM segments");
+}
+
 void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity,
                  std::string_view position) {
   SqliteStatement statement(

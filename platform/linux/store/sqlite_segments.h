@@ -31,6 +31,9 @@ std::optional<std::string> position(SqliteConnection& connection, std::uint32_t 
                                     SegmentIdentity identity);
 /// By owner, then by identity.
 std::vector<SegmentName> names(SqliteConnection& connection);
+/// Bytes of the positions of one user's segments, and of all.
+std::int64_t positionBytes(SqliteConnection& connection, std::uint32_t owner);
+std::int64_t positionBytes(SqliteConnection& connection);
 /// Inside a transaction.
 void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity,
                  std::string_view position);

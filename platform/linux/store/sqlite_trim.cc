@@ -12,6 +12,7 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_segments.h"
 
 namespace tavrel {
 namespace {
@@ -72,8 +73,12 @@ std::vector<std::int32_t> daysIn(SqliteConnection& connection) {
 }
 
 std::int64_t bytesInUseOf(SqliteConnection& connection) {
-  return (connection.integer("PRAGMA page_count") - connection.integer("PRAGMA freelist_count")) *
-         connection.integer("PRAGMA page_size");
+  const std::int64_t pages =
+      connection.integer("PRAGMA page_count") - connection.integer("PRAGMA freelist_count");
+  const bool hasSegments =
+      connection.integer("SELECT count(*) FROM sqlite_schema WHERE name = 'segments'") > 0;
+  return pages * connection.integer("PRAGMA page_size") -
+         (hasSegments ? segment_table::positionBytes(connection) : 0);
 }
 
 Expected<std::vector<std::int32_t>> SqliteTrim::days() {

@@ -33,7 +33,8 @@ class SqliteTrim {
   /// The days that have statistics, ascending. Costs two look-ups for each.
   Expected<std::vector<std::int32_t>> days();
 
-  /// Bytes of the pages that hold something, without the log.
+  /// Bytes of the pages that hold something, without the log and without the positions of segments,
+  /// which belong to no day.
   Expected<std::int64_t> bytesInUse();
 
   /// Removes the scalars and distributions of a day. On a full disk it makes do with little room
@@ -63,7 +64,7 @@ class SqliteTrim {
 /// As `SqliteTrim::days`; throws `StoreFailure`.
 std::vector<std::int32_t> daysIn(SqliteConnection& connection);
 
-/// Throws `StoreFailure`.
+/// As `SqliteTrim::bytesInUse`; throws `StoreFailure`.
 std::int64_t bytesInUseOf(SqliteConnection& connection);
 
 }  // namespace tavrel
