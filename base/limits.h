@@ -83,6 +83,10 @@ inline constexpr std::size_t kSegments = 16'384;
 /// one KiB. Segments whose positions would need more wait.
 inline constexpr std::size_t kPositionBytesPerUser = 1U << 20;
 
+/// How large the store may become by what users other than root record, in percent of its limit
+/// (`DeviceLimits`): their segments then wait. Tidying brings it back below the limit once a day.
+inline constexpr std::int64_t kFoldStorePercent = 125;
+
 /// Measurements that a fold takes from one user and in all; the segments that are left then wait
 /// for the next fold. Segments of 200,000 each that programs fill in an hour stay below.
 inline constexpr std::uint64_t kFoldValuesPerUser = 16'000'000;

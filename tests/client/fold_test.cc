@@ -727,6 +727,34 @@ TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurn) {
   EXPECT_EQ(scalar("count"), kSegments);
 }
 
+TEST_F(FoldTest, AStoreFarBeyondItsLimitTakesNothingFromUsers) {
+  if (geteuid() != 0) GTEST_SKIP() << "needs root";
+  std::filesystem::create_directories(root / "etc/tavrel");
+  std::ofstream(root / "etc/tavrel/limits.plist")
+      << R"(<plist version="1.0"><dict><key>Store</key><dict><key>Bytes</key>)"
+         R"(<integer>1048576</integer></dict></dict></plist>)";
+  const auto recordAs = [](uid_t user) {
+    run([=] {
+      ASSERT_EQ(setuid(user), 0);
+      add(1);
+      for (int i = 0; i < 60'000; ++i)
+        record(i);
+    });
+  };
+  for (int i = 0; i < 4; ++i)
+    recordAs(12);
+  for (int fold = 0; fold < 2; ++fold) {  // two, of 0.7 MB each, reach 1.25 MiB
+    EXPECT_EQ(foldNow().waiting, 2U);
+    EXPECT_EQ(log.lines.size(), fold == 0 ? 1U : 0U);
+  }
+  recordAs(0);
+  EXPECT_EQ(foldNow().values, 60'000U);
+  look();
+  EXPECT_EQ(scalar("count"), 3);
+  std::filesystem::remove(root / "etc/tavrel/limits.plist");
+  EXPECT_EQ(foldNow().waiting, 0U);
+}
+
 TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
   run([] { add(1); });
   std::array<std::byte, 256> head;

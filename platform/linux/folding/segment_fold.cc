@@ -1,6 +1,7 @@
 #include "platform/linux/folding/segment_fold.h"
 
 #include <algorithm>
+#include <limits>
 #include <map>
 #include <set>
 #include <utility>
@@ -14,10 +15,15 @@
 #include "platform/linux/folding/scalar_changes.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/folding/segment_intake.h"
+#include "platform/linux/limits/device_limits.h"
 #include "platform/linux/segments/segment_writer.h"
 
 namespace tavrel {
 namespace {
+
+// What rows and values take in the store, in bytes.
+constexpr std::int64_t kRowBytes = 160;
+constexpr std::int64_t kValueBytes = 12;
 
 struct LessName {
   bool operator()(const SegmentName& a, const SegmentName& b) const {
@@ -36,10 +42,17 @@ struct FoldedSegment {
 
 class FoldRun {
  public:
+  /// `storeBytes`: beyond them the store takes nothing from users other than root.
   /// `refusedEarlier`: segments that notes tell of and no store has counted.
   FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
-          const Recorders& recorders, FoldReport& report, std::uint64_t refusedEarlier)
-      : folder_(folder), store_(store), notes_(notes), recorders_(recorders), report_(report) {
+          const Recorders& recorders, FoldReport& report, std::int64_t storeBytes,
+          std::uint64_t refusedEarlier)
+      : folder_(folder),
+        store_(store),
+        notes_(notes),
+        recorders_(recorders),
+        report_(report),
+        storeBytes_(storeBytes) {
     counts_.segmentsRefused = refusedEarlier;
   }
 
@@ -55,6 +68,7 @@ class FoldRun {
                     const SegmentName& name, bool isWriterGone);
   Status dropPositions(SqliteBatch& batch);
   bool mustWait(const SegmentName& name);
+  bool isStoreFull() const;
   Expected<bool> hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner, std::size_t before,
                                     std::size_t most);
   void refuse(std::string_view line);
@@ -65,6 +79,7 @@ class FoldRun {
   FoldNotes& notes_;
   const Recorders& recorders_;
   FoldReport& report_;
+  const std::int64_t storeBytes_;
   const BootInstant boot_ = currentBootInstant();
 
   FoldedRows rows_;
@@ -80,6 +95,8 @@ class FoldRun {
   bool hasReplacedStore_ = false;
 
   // Of the current transaction.
+  std::int64_t bytesBefore_ = 0;  // of the store
+  std::size_t rowsBefore_ = 0;
   FoldReport counts_;
   ScalarChanges changes_;
   std::vector<FoldedSegment> folded_;
@@ -123,6 +140,10 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
     for (const SegmentName& name : *known_)
       ++positions_[name.owner];
   }
+  const auto bytes = batch.bytesInUse();
+  if (!bytes) return bytes.error();
+  bytesBefore_ = *bytes;
+  rowsBefore_ = rows_.size();
   for (const SegmentName& name : std::exchange(removed_, {})) {
     if (Status done = batch.removeSegmentPosition(name.owner, name.identity); !done) return done;
     --positions_[name.owner];
@@ -188,7 +209,19 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   return takeValues(batch, std::move(segment), reader, name, isWriterGone);
 }
 
+bool FoldRun::isStoreFull() const {
+  return bytesBefore_ + static_cast<std::int64_t>(counts_.values) * kValueBytes +
+             static_cast<std::int64_t>(rows_.size() - rowsBefore_) * kRowBytes >
+         storeBytes_;
+}
+
 bool FoldRun::mustWait(const SegmentName& name) {
+  if (name.owner != 0 && isStoreFull()) {
+    notes_.tell(
+        "the statistics store is far beyond its limit: what users other than root record waits "
+        "until days are reported and removed; see 'tavrelctl limits'");
+    return true;
+  }
   std::uint64_t& ofUser = values_[name.owner];
   if (ofUser >= limits::kFoldValuesPerUser ||
       report_.values + counts_.values >= limits::kFoldValues) {
@@ -320,14 +353,15 @@ void FoldRun::finishSegments() {
 }
 
 Status foldAll(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
-               const Recorders& recorders, FoldReport& report,
+               const Recorders& recorders, FoldReport& report, std::int64_t storeBytes,
                const SegmentFolder::Listing& listing) {
-  FoldRun fold(folder, store, notes, recorders, report, 0);
+  FoldRun fold(folder, store, notes, recorders, report, storeBytes, 0);
   Status done = fold.run(listing);
   if (!fold.hasReplacedStore()) return done;
   // The new store knows no positions, and what earlier transactions took is lost with the other.
   report.waiting = 0;
-  return FoldRun(folder, store, notes, recorders, report, fold.refusedSegments()).run(listing);
+  return FoldRun(folder, store, notes, recorders, report, storeBytes, fold.refusedSegments())
+      .run(listing);
 }
 
 }  // namespace
@@ -354,7 +388,13 @@ FoldReport SegmentFold::run() {
     report.failure = listing.error().message;
   } else if (!listing->segments.empty() || !listing->refusals.empty()) {
     const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
-    if (const Status done = foldAll(**folder, store_, *notes, recorders, report, *listing); !done) {
+    // While the file of limits has a fault, nobody knows what the store may hold.
+    const auto bounds = DeviceLimits::read(root_, files_, propertyLists_);
+    const std::int64_t most = bounds
+                                  ? bounds->of(Kept::Store).bytes / 100 * limits::kFoldStorePercent
+                                  : std::numeric_limits<std::int64_t>::max();
+    if (const Status done = foldAll(**folder, store_, *notes, recorders, report, most, *listing);
+        !done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
     }
   }

@@ -28,6 +28,8 @@ class FoldedRows {
   /// Nothing when the row would be one too many. The first user of a row is charged with it.
   Row* find(std::uint32_t user, std::int32_t day, std::string_view key, bool isScalar);
 
+  std::size_t size() const { return rows_.size(); }
+
  private:
   std::unordered_map<std::uint64_t, Row> rows_;  // by a keyed hash of its name
   std::unordered_map<std::uint32_t, std::size_t> counts_;

@@ -8,6 +8,7 @@
 #include "platform/linux/store/distribution_writer.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
+#include "platform/linux/store/sqlite_trim.h"
 
 namespace tavrel {
 namespace {
@@ -237,6 +238,15 @@ Expected<std::int64_t> SqliteBatch::segmentPositionBytes(std::uint32_t owner) {
   try {
     begin();
     return segment_table::positionBytes(connection_, owner);
+  } catch (const StoreFailure& failure) {
+    return fail(failure);
+  }
+}
+
+Expected<std::int64_t> SqliteBatch::bytesInUse() {
+  try {
+    begin();
+    return bytesInUseOf(connection_);
   } catch (const StoreFailure& failure) {
     return fail(failure);
   }

@@ -69,6 +69,9 @@ class SqliteBatch {
                             std::string_view position);
   Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);
 
+  /// As `SqliteTrim::bytesInUse`, with what this batch has written.
+  Expected<std::int64_t> bytesInUse();
+
   /// From now on, values for a distribution that takes none, as its row is damaged or full, are
   /// dropped in place of failing the batch. The first such row is a line in the log.
   void refuseUnwritableSeries() { refuses_ = true; }
