@@ -33,23 +33,38 @@ void end(z_stream* stream) {
   delete stream;
 }
 
-// Feeds what is in the stream's input, and the end of the content when there is no more.
-void deflateInto(z_stream& stream, int flush, std::string& out) {
-  std::array<unsigned char, kPiece> piece;
-  do {
-    stream.next_out = piece.data();
-    stream.avail_out = piece.size();
-    deflate(&stream, flush);
-    out.append(reinterpret_cast<const char*>(piece.data()), piece.size() - stream.avail_out);
-  } while (stream.avail_out == 0);
-}
-
 }  // namespace
 
 std::optional<FileStamp> stampOf(const std::string& path) {
   struct stat status {};
   if (lstat(path.c_str(), &status) != 0 || !S_ISREG(status.st_mode)) return std::nullopt;
   return stampFrom(status);
+}
+
+Expected<std::optional<ReadLog>> readLog(const std::string& path) {
+  const Descriptor file(
+      open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY));
+  if (!file && errno == ENOENT) return std::optional<ReadLog>();
+  if (!file) return systemError("read", path);
+  struct stat status {};
+  if (fstat(file.get(), &status) != 0) return systemError("read", path);
+  if (!S_ISREG(status.st_mode)) return Error{format("cannot read %s: not a regular file", path)};
+
+  ReadLog log{{}, stampFrom(status)};
+  log.content.reserve(
+      std::min(static_cast<std::size_t>(status.st_size), limits::kPropertyListBytes));
+  std::array<char, kPiece> piece;
+  while (true) {
+    const ssize_t size = read(file.get(), piece.data(), piece.size());
+    if (size < 0 && errno == EINTR) continue;
+    if (size < 0) return systemError("read", path);
+    if (size == 0) return std::optional(std::move(log));
+    log.content.append(piece.data(), static_cast<std::size_t>(size));
+    if (log.content.size() > limits::kPropertyListBytes) {
+      return Error{format("cannot read %s: it has more than %llu bytes", path,
+                          std::uint64_t{limits::kPropertyListBytes})};
+    }
+  }
 }
 
 LogPacker::LogPacker() : stream_(new z_stream{}, end) {
@@ -59,37 +74,25 @@ LogPacker::LogPacker() : stream_(new z_stream{}, end) {
   }
 }
 
-Expected<std::optional<PackedLog>> LogPacker::pack(const std::string& path) {
-  const Descriptor file(
-      open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK | O_NOCTTY));
-  if (!file && errno == ENOENT) return std::optional<PackedLog>();
-  if (!file) return systemError("read", path);
-  struct stat status {};
-  if (fstat(file.get(), &status) != 0) return systemError("read", path);
-  if (!S_ISREG(status.st_mode)) return Error{format("cannot read %s: not a regular file", path)};
-
-  PackedLog log{{}, {}, stampFrom(status)};
+PackedLog LogPacker::pack(ByteSpan content, const FileStamp& stamp) {
+  PackedLog log{{}, {}, stamp};
   deflateReset(stream_.get());
+  // zlib does not write there.
+  auto* const bytes = const_cast<std::byte*>(content.data());
+  stream_->next_in = reinterpret_cast<unsigned char*>(bytes);
+  stream_->avail_in = static_cast<unsigned>(content.size());
   std::array<unsigned char, kPiece> piece;
-  std::size_t total = 0;
-  while (true) {
-    const ssize_t size = read(file.get(), piece.data(), piece.size());
-    if (size < 0 && errno == EINTR) continue;
-    if (size < 0) return systemError("read", path);
-    total += static_cast<std::size_t>(size);
-    if (total > limits::kPropertyListBytes) {
-      return Error{format("cannot read %s: it has more than %llu bytes", path,
-                          std::uint64_t{limits::kPropertyListBytes})};
-    }
-    stream_->next_in = piece.data();
-    stream_->avail_in = static_cast<unsigned>(size);
-    deflateInto(*stream_, size == 0 ? Z_FINISH : Z_NO_FLUSH, log.content);
-    if (size == 0) break;
-  }
+  do {
+    stream_->next_out = piece.data();
+    stream_->avail_out = piece.size();
+    deflate(stream_.get(), Z_FINISH);
+    log.content.append(reinterpret_cast<const char*>(piece.data()),
+                       piece.size() - stream_->avail_out);
+  } while (stream_->avail_out == 0);
   log.digest = "sha-256=:";
   appendBase64(log.digest, sha256(asBytes(log.content)));
   log.digest += ':';
-  return std::optional(std::move(log));
+  return log;
 }
 
 }  // namespace tavrel::upload

@@ -1,4 +1,4 @@
-// A log as it travels: compressed, with a digest.
+// A log as it is read, and as it travels: compressed, with a digest.
 #pragma once
 
 #include <cstdint>
@@ -7,6 +7,7 @@
 #include <string>
 #include <sys/types.h>
 
+#include "base/bytes.h"
 #include "base/expected.h"
 
 struct z_stream_s;
@@ -27,6 +28,14 @@ struct FileStamp {
 /// The stamp of a regular file; nothing for a missing one, or anything else.
 std::optional<FileStamp> stampOf(const std::string& path);
 
+struct ReadLog {
+  std::string content;
+  FileStamp stamp;
+};
+
+/// Nothing when there is no such file. Of a log that grows meanwhile, any beginning.
+Expected<std::optional<ReadLog>> readLog(const std::string& path);
+
 struct PackedLog {
   std::string content;  // in gzip's form
   std::string digest;   // of `content`, as the header Content-Digest has it (RFC 9530)
@@ -38,8 +47,7 @@ class LogPacker {
  public:
   LogPacker();
 
-  /// Nothing when there is no such file. Of a log that grows meanwhile, any beginning.
-  Expected<std::optional<PackedLog>> pack(const std::string& path);
+  PackedLog pack(ByteSpan content, const FileStamp& stamp);
 
  private:
   std::unique_ptr<z_stream_s, void (*)(z_stream_s*)> stream_;

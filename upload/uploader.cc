@@ -205,17 +205,18 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
                     percentEncoded(outbox_.logPath(log.name))));
     return Step::Next;
   }
-  const auto packed = packer_.pack(outbox_.logPath(log.name));
-  const auto day = packed ? dayOf(log) : packed.error();
-  if (!day) {
-    complain(day.error().message);
+  const auto ready = prepare(log);
+  if (!ready) {
+    complain(ready.error().message);
     return Step::Next;
   }
-  if (!*packed || !*day) return Step::Next;
+  if (!*ready) return Step::Next;
+  const PackedLog& packed = (*ready)->packed;
+  const std::int64_t day = (*ready)->day;
   std::vector<std::string> headers = metadataHeaders(metadataOf(log));
-  headers.push_back(std::string(kDigestHeader) + ": " + (*packed)->digest);
+  headers.push_back(std::string(kDigestHeader) + ": " + packed.digest);
 
-  if (const Step asked = askPermission(**day); asked != Step::Next) return asked;
+  if (const Step asked = askPermission(day); asked != Step::Next) return asked;
   const std::chrono::milliseconds left = timeLeft();
   if (left <= std::chrono::milliseconds(0)) {
     services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
@@ -224,11 +225,11 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   }
   tried_ = true;
   const auto answer =
-      connection_->put(configuration_.url + "/" + log.name + ".log", headers, (*packed)->content,
+      connection_->put(configuration_.url + "/" + log.name + ".log", headers, packed.content,
                        std::min<std::chrono::milliseconds>(configuration_.transfer, left),
-                       [&] { return askPermission(**day) == Step::Next; });
-  if (answer) return judge(log, *answer, **packed);
-  if (const Step asked = askPermission(**day); asked != Step::Next) return asked;
+                       [&] { return askPermission(day) == Step::Next; });
+  if (answer) return judge(log, *answer, packed);
+  if (const Step asked = askPermission(day); asked != Step::Next) return asked;
   if (connection_->isMisconfigured()) {
     complain(format("cannot send logs: %s: correct the credentials of tavrel-upload",
                     answer.error().message));
@@ -246,14 +247,16 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
   return value ? value->dictionary() : plist::Dictionary();
 }
 
-// The submission service judges a log without statistics by the day on which it was made, too.
-Expected<std::optional<std::int64_t>> Uploader::dayOf(const WaitingLog& log) {
-  const auto bytes =
-      services_.files.readIfPresent(outbox_.logPath(log.name), limits::kPropertyListBytes);
-  if (!bytes) return bytes.error();
-  if (!*bytes) return std::optional<std::int64_t>();
-  const std::optional<std::int64_t> day = dayOfLog(**bytes, services_.propertyLists);
-  return day ? day : daysFromCivil(civilFromSeconds(log.filed).date);
+Expected<std::optional<Uploader::ReadyLog>> Uploader::prepare(const WaitingLog& log) {
+  // Once, so that what is sent is what the permission is asked for.
+  const auto read = readLog(outbox_.logPath(log.name));
+  if (!read) return read.error();
+  if (!*read) return std::optional<ReadyLog>();
+  const auto& [content, stamp] = **read;
+  const std::optional<std::int64_t> day = dayOfLog(content, services_.propertyLists);
+  // The submission service judges a log without statistics by the day on which it was made, too.
+  const std::int64_t filed = daysFromCivil(civilFromSeconds(log.filed).date);
+  return std::optional(ReadyLog{packer_.pack(asBytes(content), stamp), day.value_or(filed)});
 }
 
 Uploader::Step Uploader::askPermission(std::int64_t day) {

@@ -56,6 +56,10 @@ class Uploader {
 
  private:
   enum class Permission { Given, Withdrawn, NotGiven };
+  struct ReadyLog {
+    PackedLog packed;
+    std::int64_t day;  // that the permission must cover
+  };
   enum class Step { Next, Held, Stop, Broken, Withdrawn, Misconfigured };
 
   /// Reads `permitted_` again. `NotGiven` also when its first day is not a day.
@@ -64,8 +68,8 @@ class Uploader {
   Outcome sendAll(std::vector<WaitingLog> logs);
   Step send(const WaitingLog& log);
   plist::Dictionary metadataOf(const WaitingLog& log);
-  /// The day that the permission must cover; nothing when the log has gone.
-  Expected<std::optional<std::int64_t>> dayOf(const WaitingLog& log);
+  /// Nothing when the log has gone.
+  Expected<std::optional<ReadyLog>> prepare(const WaitingLog& log);
   /// Whether a log of `day` may be sent now; `Next` when it may.
   Step askPermission(std::int64_t day);
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);

@@ -58,15 +58,19 @@ struct Device : DeviceServices {
   upload::State state() {
     return upload::readState(files, coding, log, root.path(upload::kStatePath));
   }
-  Outcome run(bool atOnce = false) {
-    return upload::Uploader({root, files, coding, preferences, clock, log}, configuration)
+  Outcome run(bool atOnce = false) { return run(atOnce, files); }
+  Outcome run(bool atOnce, FileSystem& fileSystem) {
+    return upload::Uploader({root, fileSystem, coding, preferences, clock, log}, configuration)
         .run(atOnce);
   }
   Outcome runAgainst(const ScriptedServer& server, bool atOnce = false) {
+    return runAgainst(server, atOnce, files);
+  }
+  Outcome runAgainst(const ScriptedServer& server, bool atOnce, FileSystem& fileSystem) {
     configuration.url = server.url();
     configuration.host = "127.0.0.1";
     configuration.mayBePlain = true;
-    return run(atOnce);
+    return run(atOnce, fileSystem);
   }
   void use(const std::string& url, const std::string& folder, const std::string& authority,
            const std::string& certificate) {

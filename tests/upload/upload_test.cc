@@ -267,6 +267,33 @@ TEST(Upload, JudgesEachLogByItsDay) {
   }
 }
 
+// Calls `reach` before a file is opened.
+struct WatchedFiles final : FileSystem {
+  int openFile(const char* path, int flags, mode_t mode) override {
+    if (path == watched) reach();
+    return FileSystem::openFile(path, flags, mode);
+  }
+  std::string watched;
+  std::function<void()> reach;
+};
+
+TEST(Upload, SendsWhatThePermissionIsAskedFor) {
+  Device device;
+  device.permit("<true/>", "<integer>20784</integer>");
+  device.write(kOutbox + nameOf(1) + ".log", kOfTheDayBefore);
+  WatchedFiles files;
+  files.watched = device.root.path(kOutbox + nameOf(1) + ".log");
+  files.reach = [&] { device.add(nameOf(1)); };
+  int requests = 0;
+  ScriptedServer server([&](const std::string&) {
+    ++requests;
+    return kOk;
+  });
+  EXPECT_EQ(device.runAgainst(server, false, files), Outcome::Done);
+  EXPECT_EQ(requests, 0) << "the log of a day that is not permitted, which another replaced";
+  EXPECT_TRUE(device.log.says("logs of earlier days wait: 1"));
+}
+
 TEST(Upload, LosesNoLogThatChangesMeanwhile) {
   Device device;
   for (int number = 1; number < 5; ++number)
