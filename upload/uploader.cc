@@ -43,6 +43,19 @@ bool isPlain(std::string_view name) {
          });
 }
 
+// Keeps runs apart; nothing while another process has it.
+Expected<std::optional<Descriptor>> lockRun(const Services& services) {
+  const std::string path = services.root.path(kLockPath);
+  if (Status made = services.files.makeFolders(path.substr(0, path.rfind('/'))); !made) {
+    return made.error();
+  }
+  Descriptor lock(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NOCTTY, 0600));
+  if (!lock) return systemError("open", path);
+  if (flock(lock.get(), LOCK_EX | LOCK_NB) == 0) return std::optional(std::move(lock));
+  if (errno == EWOULDBLOCK) return std::optional<Descriptor>();
+  return systemError("lock", path);
+}
+
 }  // namespace
 
 Uploader::Uploader(const Services& services, const Configuration& configuration)
@@ -52,6 +65,9 @@ Uploader::Uploader(const Services& services, const Configuration& configuration)
       statePath_(services.root.path(kStatePath)) {}
 
 void noteFailure(const Services& services, std::string_view why) {
+  const auto lock = lockRun(services);
+  if (!lock) services.log.write(LogLevel::Error, lock.error().message);
+  if (!lock || !*lock) return;
   const std::string path = services.root.path(kStatePath);
   State state = readState(services.files, services.propertyLists, services.log, path);
   state.failure = why;
@@ -85,22 +101,12 @@ void Uploader::complain(std::string_view line) {
 }
 
 Outcome Uploader::run(bool atOnce) {
-  const std::string path = services_.root.path(kLockPath);
-  if (Status made = services_.files.makeFolders(path.substr(0, path.rfind('/'))); !made) {
-    complain(made.error().message);
-    return Outcome::Failed;
-  }
-  const Descriptor lock(
-      open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NOCTTY, 0600));
+  const auto lock = lockRun(services_);
   if (!lock) {
-    complain(systemError("open", path).message);
+    complain(lock.error().message);
     return Outcome::Failed;
   }
-  if (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
-    if (errno == EWOULDBLOCK) return Outcome::Done;
-    complain(systemError("lock", path).message);
-    return Outcome::Failed;
-  }
+  if (!*lock) return Outcome::Done;
   Outcome outcome = runLocked(atOnce);
   if (!complaint_.empty()) {
     state_.failure = complaint_;

@@ -37,7 +37,8 @@ struct Services {
   SystemLog& log;
 };
 
-/// Keeps for `tavrelctl status --check` why a run could not even begin.
+/// Keeps for `tavrelctl status --check` why a run could not even begin; nothing while another run
+/// is on, which keeps how it ends itself.
 void noteFailure(const Services& services, std::string_view why);
 
 enum class Outcome {

@@ -1,6 +1,8 @@
 // A device whose logs are sent, beside the servers that they are sent to.
 #pragma once
 
+#include <sys/file.h>
+
 #include "servers.h"
 #include "tests/platform/device_services.h"
 #include "upload/uploader.h"
@@ -54,6 +56,12 @@ struct Device : DeviceServices {
   }
   Lines names(const std::string& place = "outbox") {
     return *files.list(root.path(kSubmission + place));
+  }
+  /// What a run of another process holds. One has been there before.
+  Descriptor lockRuns() const {
+    Descriptor lock(open(root.path("/var/lib/tavrel/upload/lock").c_str(), O_RDWR | O_CLOEXEC));
+    EXPECT_EQ(flock(lock.get(), LOCK_EX | LOCK_NB), 0);
+    return lock;
   }
   upload::State state() {
     return upload::readState(files, coding, log, root.path(upload::kStatePath));

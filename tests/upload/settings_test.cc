@@ -194,6 +194,9 @@ TEST(Upload, TellsTheServiceManagerHowItEnded) {
   EXPECT_EQ(run(""), 78);
   EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().failedTransfers),
             std::tuple(3, 2));
+  const auto lock = device.lockRuns();
+  EXPECT_EQ(run(""), 78);
+  EXPECT_EQ(device.state().failedAttempts, 3) << "another run writes the state when it ends";
 }
 
 }  // namespace

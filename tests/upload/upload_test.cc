@@ -1,5 +1,4 @@
 #include <regex>
-#include <sys/file.h>
 #include <zlib.h>
 
 #include "base/limits.h"
@@ -317,8 +316,7 @@ TEST(Upload, LosesNoLogThatChangesMeanwhile) {
   EXPECT_EQ(device.names(), Lines{"other name.log"}) << "the changed one was sent by another pass";
   EXPECT_EQ(requests, 5);
 
-  const Descriptor lock(open(device.root.path("/var/lib/tavrel/upload/lock").c_str(), O_RDWR));
-  ASSERT_EQ(flock(lock.get(), LOCK_EX | LOCK_NB), 0);
+  const Descriptor lock = device.lockRuns();
   device.add(nameOf(1));
   device.log.lines.clear();
   EXPECT_EQ(device.run(), Outcome::Done) << "while another uploader is at work";
