@@ -241,7 +241,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
                     answer.error().message));
     return Step::Misconfigured;
   }
-  return fail(log, answer.error().message);
+  return failToSend(log, answer.error().message);
 }
 
 // A log without readable metadata is sent without.
@@ -300,7 +300,7 @@ Uploader::Step Uploader::judge(const WaitingLog& log, const Answer& answer,
   } else if (status == 404) {
     why += ": check URL";
   }
-  return fail(log, why, answer.retryAfter);
+  return failToSend(log, why, answer.retryAfter);
 }
 
 Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed) {
@@ -309,7 +309,7 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
     complain(format("log %s was changed while it was sent: it is sent again", log.name));
     return Step::Next;
   }
-  if (Status removed = outbox_.remove(log.name); !removed) return failToMove(log, removed.error());
+  if (Status removed = outbox_.remove(log.name); !removed) return failToMove(removed.error());
   ++sent_;
   ++state_.sent;
   state_.lastSuccess = services_.clock.now();
@@ -320,7 +320,7 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
 Uploader::Step Uploader::giveUp(const WaitingLog& log, long status) {
   services_.log.log(LogLevel::Error, "the server refuses log %s (%ld): it is kept in %s/refused",
                     log.name, status, outbox_.folder());
-  if (Status moved = outbox_.refuse(log.name); !moved) return failToMove(log, moved.error());
+  if (Status moved = outbox_.refuse(log.name); !moved) return failToMove(moved.error());
   ++refused_;
   ++state_.refused;
   succeed();
@@ -334,14 +334,18 @@ void Uploader::succeed() {
   state_.failedTransfers = 0;
 }
 
-Uploader::Step Uploader::failToMove(const WaitingLog& log, const Error& error) {
-  complain(error.message);
-  fail(log, error.message);
+Uploader::Step Uploader::failToMove(const Error& error) {
+  fail(error.message, 0);
   return Step::Broken;
 }
 
-Uploader::Step Uploader::fail(const WaitingLog& log, std::string_view why,
-                              std::int64_t serverWish) {
+Uploader::Step Uploader::failToSend(const WaitingLog& log, std::string_view why,
+                                    std::int64_t serverWish) {
+  fail(format("cannot send log %s: %s", log.name, why), serverWish);
+  return Step::Stop;
+}
+
+void Uploader::fail(std::string line, std::int64_t serverWish) {
   const plist::Date now = services_.clock.now();
   failed_ = true;
   ++state_.failedTransfers;
@@ -349,10 +353,9 @@ Uploader::Step Uploader::fail(const WaitingLog& log, std::string_view why,
   const double next =
       now.secondsSinceEpoch() + pauseSeconds(state_.failedTransfers, serverWish, chance());
   state_.nextAttempt = plist::Date::sinceEpoch(next);
-  state_.failure = format("cannot send log %s: %s", log.name, why);
+  state_.failure = std::move(line);
   services_.log.log(LogLevel::Error, "%s; next attempt after %s", state_.failure,
                     isoDateText(plist::Date::sinceEpoch(std::ceil(next))));
-  return Step::Stop;
 }
 
 Outcome Uploader::removeWaiting() {

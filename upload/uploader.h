@@ -76,9 +76,10 @@ class Uploader {
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
   Step confirm(const WaitingLog& log, const PackedLog& packed);
   Step giveUp(const WaitingLog& log, long status);
+  Step failToSend(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
+  Step failToMove(const Error& error);
   /// Notes the failure, and when the next attempt is.
-  Step fail(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
-  Step failToMove(const WaitingLog& log, const Error& error);
+  void fail(std::string line, std::int64_t serverWish);
   void succeed();
   /// Something on the device itself is in the way.
   void complain(std::string_view line);

@@ -266,11 +266,16 @@ TEST(Upload, JudgesEachLogByItsDay) {
   }
 }
 
-// Calls `reach` before a file is opened.
+// Calls `reach` before one file is opened. The file cannot be removed.
 struct WatchedFiles final : FileSystem {
   int openFile(const char* path, int flags, mode_t mode) override {
     if (path == watched) reach();
     return FileSystem::openFile(path, flags, mode);
+  }
+  int removeFile(const char* path) override {
+    if (path != watched) return FileSystem::removeFile(path);
+    errno = EIO;
+    return -1;
   }
   std::string watched;
   std::function<void()> reach;
@@ -291,6 +296,21 @@ TEST(Upload, SendsWhatThePermissionIsAskedFor) {
   EXPECT_EQ(device.runAgainst(server, false, files), Outcome::Done);
   EXPECT_EQ(requests, 0) << "the log of a day that is not permitted, which another replaced";
   EXPECT_TRUE(device.log.says("logs of earlier days wait: 1"));
+}
+
+TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
+  Device device;
+  device.add(nameOf(1));
+  device.add(nameOf(2));
+  WatchedFiles files;
+  files.watched = device.root.path(kOutbox + nameOf(1) + ".log");
+  EXPECT_EQ(device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, files),
+            Outcome::Failed);
+  const std::string line = "cannot remove " + files.watched + ": Input/output error";
+  ASSERT_EQ(device.log.lines.size(), 1U);
+  EXPECT_TRUE(device.log.lines[0].starts_with(line + "; next attempt after 2026-11-27T18:"));
+  EXPECT_EQ(device.state().failure, line);
+  EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().sent), std::tuple(1, 0));
 }
 
 TEST(Upload, LosesNoLogThatChangesMeanwhile) {
