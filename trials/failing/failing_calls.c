@@ -1,33 +1,56 @@
-/* Preloaded into a program by script/failing-calls: lets one call of a kind fail, or all from it
+/* Preloaded into a program by script/failing-calls: makes one call of a kind fail, or all from it
  * on.
  *
- *   FAILING_KIND    allocation, open, read, write, flush, rename, map or truncate
+ *   FAILING_KIND    one of kNames
  *   FAILING_AT      which call of that kind, from 1; "12+" is the twelfth and all later ones
- *   FAILING_MARK    a file that is made once a call has failed
+ *   FAILING_MARK    a file that is made once a call has failed; it is empty when that was before
+ *                   `main`, else it has one byte
  */
 #define _GNU_SOURCE
+#include <dirent.h>
 #include <dlfcn.h>
 #include <errno.h>
 #include <fcntl.h>
+#include <pthread.h>
 #include <stdarg.h>
 #include <stdatomic.h>
 #include <stdbool.h>
+#include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <sys/file.h>
 #include <sys/mman.h>
+#include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/uio.h>
 #include <unistd.h>
 
-enum Kind { kNone, kAllocation, kOpen, kRead, kWrite, kFlush, kRename, kMap, kTruncate };
+enum Kind {
+  kNone,
+  kAllocation,
+  kOpen,
+  kRead,
+  kWrite,
+  kFlush,
+  kRename,
+  kMap,
+  kTruncate,
+  kRemove,
+  kFolder,
+  kLock,
+  kThread,
+  kKinds
+};
 
-static const char* const kNames[] = {"none",  "allocation", "open", "read",    "write",
-                                     "flush", "rename",     "map",  "truncate"};
+static const char* const kNames[kKinds] = {"none",   "allocation", "open",  "read",     "write",
+                                           "flush",  "rename",     "map",   "truncate", "remove",
+                                           "folder", "lock",       "thread"};
 
 static enum Kind kind;
 static long at;
 static bool andLater;
 static const char* mark;
+static bool mainBegan;
 static atomic_long calls;
 
 __attribute__((constructor)) static void readSettings(void) {
@@ -38,21 +61,9 @@ __attribute__((constructor)) static void readSettings(void) {
   char* end = NULL;
   at = strtol(number, &end, 10);
   andLater = *end == '+';
-  for (enum Kind each = kAllocation; each <= kTruncate; ++each) {
+  for (enum Kind each = kAllocation; each < kKinds; ++each) {
     if (strcmp(name, kNames[each]) == 0) kind = each;
   }
-}
-
-static bool fails(enum Kind called, int error) {
-  if (called != kind) return false;
-  const long number = atomic_fetch_add(&calls, 1) + 1;
-  if (number != at && !(andLater && number > at)) return false;
-  if (number == at) {
-    const long file = syscall(SYS_openat, AT_FDCWD, mark, O_CREAT | O_WRONLY, 0600);
-    if (file >= 0) syscall(SYS_close, file);
-  }
-  errno = error;
-  return true;
 }
 
 /* The function of the C library. Found while it is called, as dlsym itself may allocate. */
@@ -62,6 +73,39 @@ static bool fails(enum Kind called, int error) {
     void* const found = dlsym(RTLD_NEXT, #name); \
     memcpy(&real, &found, sizeof real);          \
   }
+
+static void leaveMark(void) {
+  REAL(syscall)
+  const long file = real(SYS_openat, AT_FDCWD, mark, O_CREAT | O_WRONLY, 0600);
+  if (file < 0) return;
+  if (mainBegan) real(SYS_write, file, "x", 1L);
+  real(SYS_close, file);
+}
+
+static bool fails(enum Kind called, int error) {
+  if (called != kind) return false;
+  const long number = atomic_fetch_add(&calls, 1) + 1;
+  if (number != at && !(andLater && number > at)) return false;
+  if (number == at) leaveMark();
+  errno = error;
+  return true;
+}
+
+typedef int Main(int, char**, char**);
+
+static Main* programMain;
+
+static int beginMain(int count, char** arguments, char** environment) {
+  mainBegan = true;
+  return programMain(count, arguments, environment);
+}
+
+int __libc_start_main(Main* program, int count, char** arguments, void (*start)(void),
+                      void (*end)(void), void (*loaderEnd)(void), void* stackEnd) {
+  REAL(__libc_start_main)
+  programMain = program;
+  return real(beginMain, count, arguments, start, end, loaderEnd, stackEnd);
+}
 
 extern void* __libc_malloc(size_t size);
 extern void* __libc_calloc(size_t count, size_t size);
@@ -96,6 +140,26 @@ int open64(const char* path, int flags, ...) {
   va_end(arguments);
   REAL(open64)
   return fails(kOpen, EMFILE) ? -1 : real(path, flags, mode);
+}
+int openat64(int folder, const char* path, int flags, ...) {
+  va_list arguments;
+  va_start(arguments, flags);
+  const mode_t mode = modeOf(flags, arguments);
+  va_end(arguments);
+  REAL(openat64)
+  return fails(kOpen, EMFILE) ? -1 : real(folder, path, flags, mode);
+}
+FILE* fopen(const char* path, const char* mode) {
+  REAL(fopen)
+  return fails(kOpen, EMFILE) ? NULL : real(path, mode);
+}
+FILE* fopen64(const char* path, const char* mode) {
+  REAL(fopen64)
+  return fails(kOpen, EMFILE) ? NULL : real(path, mode);
+}
+DIR* opendir(const char* path) {
+  REAL(opendir)
+  return fails(kOpen, EMFILE) ? NULL : real(path);
 }
 int openat(int folder, const char* path, int flags, ...) {
   va_list arguments;
@@ -174,4 +238,86 @@ int ftruncate(int file, off_t length) {
 int ftruncate64(int file, off64_t length) {
   REAL(ftruncate64)
   return fails(kTruncate, ENOSPC) ? -1 : real(file, length);
+}
+
+int unlink(const char* path) {
+  REAL(unlink)
+  return fails(kRemove, EIO) ? -1 : real(path);
+}
+int unlinkat(int folder, const char* path, int flags) {
+  REAL(unlinkat)
+  return fails(kRemove, EIO) ? -1 : real(folder, path, flags);
+}
+
+int mkdir(const char* path, mode_t mode) {
+  REAL(mkdir)
+  return fails(kFolder, ENOSPC) ? -1 : real(path, mode);
+}
+int mkdirat(int folder, const char* path, mode_t mode) {
+  REAL(mkdirat)
+  return fails(kFolder, ENOSPC) ? -1 : real(folder, path, mode);
+}
+
+int flock(int file, int operation) {
+  REAL(flock)
+  return fails(kLock, ENOLCK) ? -1 : real(file, operation);
+}
+
+int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*start)(void*),
+                   void* argument) {
+  REAL(pthread_create)
+  return fails(kThread, EAGAIN) ? EAGAIN : real(thread, attributes, start, argument);
+}
+
+/* What libbrimhold calls so, past the functions above. */
+long syscall(long number, ...) {
+  va_list arguments;
+  va_start(arguments, number);
+  long values[6];
+  for (int i = 0; i < 6; ++i)
+    values[i] = va_arg(arguments, long);
+  va_end(arguments);
+  if (number == SYS_openat && fails(kOpen, EMFILE)) return -1;
+  if (number == SYS_read && fails(kRead, EIO)) return -1;
+  if (number == SYS_fallocate && fails(kTruncate, ENOSPC)) return -1;
+  REAL(syscall)
+  return real(number, values[0], values[1], values[2], values[3], values[4], values[5]);
+}
+
+/* What the functions above become where the compiler checks sizes (_FORTIFY_SOURCE). */
+extern int __open_2(const char* path, int flags);
+extern int __open64_2(const char* path, int flags);
+extern int __openat_2(int folder, const char* path, int flags);
+extern int __openat64_2(int folder, const char* path, int flags);
+extern ssize_t __read_chk(int file, void* bytes, size_t length, size_t room);
+extern ssize_t __pread_chk(int file, void* bytes, size_t length, off_t offset, size_t room);
+extern ssize_t __pread64_chk(int file, void* bytes, size_t length, off64_t offset, size_t room);
+
+int __open_2(const char* path, int flags) {
+  REAL(__open_2)
+  return fails(kOpen, EMFILE) ? -1 : real(path, flags);
+}
+int __open64_2(const char* path, int flags) {
+  REAL(__open64_2)
+  return fails(kOpen, EMFILE) ? -1 : real(path, flags);
+}
+int __openat_2(int folder, const char* path, int flags) {
+  REAL(__openat_2)
+  return fails(kOpen, EMFILE) ? -1 : real(folder, path, flags);
+}
+int __openat64_2(int folder, const char* path, int flags) {
+  REAL(__openat64_2)
+  return fails(kOpen, EMFILE) ? -1 : real(folder, path, flags);
+}
+ssize_t __read_chk(int file, void* bytes, size_t length, size_t room) {
+  REAL(__read_chk)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length, room);
+}
+ssize_t __pread_chk(int file, void* bytes, size_t length, off_t offset, size_t room) {
+  REAL(__pread_chk)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length, offset, room);
+}
+ssize_t __pread64_chk(int file, void* bytes, size_t length, off64_t offset, size_t room) {
+  REAL(__pread64_chk)
+  return fails(kRead, EIO) ? -1 : real(file, bytes, length, offset, room);
 }

@@ -1,0 +1,207 @@
+"""What must hold on a device after a call failed in a program, by program."""
+
+import contextlib
+import functools
+import plistlib
+import re
+import sqlite3
+
+from programs import Broken, LogServer, run, tool
+
+PENDING = "var/mobile/Library/Logs/Submission/pending"
+MOMENT = re.compile(r"<date>.*Z</date>")
+NOT_IN_THE_LOG = re.compile(" error (statistics store|cannot finish the daily log|cannot file log|"
+                            "cannot read|Couldn't load whitelist|Failed to write)")
+NAMED = re.compile(' distribution "([^"]*)"')
+
+
+def values(root):
+    """All statistics of the store and of what waits, as text."""
+    return "\n".join(line for line in tool(root, "stat", "export").splitlines()
+                     if "com.example." in line or "statsd." in line)
+
+
+def logs(root):
+    """What the submitted logs hold, without the moment at which they were made."""
+    found = []
+    for path in sorted((root / PENDING).glob("log-tallied-*.log")):
+        log = plistlib.loads(path.read_bytes())
+        del log["BHLogCreationDate"]
+        if not path.with_suffix(".metadata.plist").exists():
+            raise Broken(f"{path.name} has no metadata")
+        found.append(log)
+    return found
+
+
+@functools.cache
+def wanted(look, reference):
+    """What a look at a reference shows, which does not change."""
+    return look(reference)
+
+
+def after_daily(device, reference, done):
+    if done.returncode != 0:
+        raise Broken(f"the daemon ends with {done.returncode}")
+    next_daily_run(device, "-d")
+    if values(device) != wanted(values, reference):
+        raise Broken("statistics differ")
+    found, right = logs(device), wanted(logs, reference)[0]
+    # A run that was cut off after it filed its log files it again.
+    if 0 < len(found) <= 2 and all(log == right for log in found):
+        return
+    # What the log lacks is said, nothing in it is wrong, and a forced run files the whole one.
+    said_why = [line for line in errors_of(done) if NOT_IN_THE_LOG.search(line)]
+    wrong = [key for log in found for key in lacks_or_differs(log, right, said_why)]
+    if not said_why or wrong:
+        raise Broken(f"{len(found)} logs, different in {wrong}; the run said: {errors_of(done)}")
+    next_daily_run(device, "-f")
+    if logs(device).count(right) != found.count(right) + 1:
+        raise Broken("a forced run does not file the log")
+
+
+def next_daily_run(device, mode):
+    done, _ = run(device, ["tavrel", mode])
+    errors = errors_of(done)
+    if done.returncode != 0 or errors:
+        raise Broken(f"tavrel {mode} ends with {done.returncode}: {errors}")
+
+
+def errors_of(done):
+    return [line for line in done.stderr.splitlines() if "Z error " in line]
+
+
+def lacks_or_differs(log, right, said_why):
+    """The entries of a log that nobody said would be missing, or that are wrong."""
+    named = [match[1] for line in said_why if (match := NAMED.search(line))]
+    for group in sorted({*log, *right}):
+        ours, theirs = log.get(group), right.get(group)
+        if not isinstance(theirs, dict):
+            if ours != theirs:
+                yield group
+            continue
+        for key in sorted({*(ours or {}), *theirs}):
+            is_absent = key not in (ours or {})
+            if not (is_absent and (not named or key in named)) and (
+                    is_absent or ours[key] != theirs.get(key)):
+                yield key
+
+
+def after_fold(device, reference, done):
+    tool(device, "stat", "fold")
+    if values(device) != wanted(values, reference):
+        raise Broken("statistics differ")
+    said(done)
+
+
+def after_add(device, _, done):
+    tool(device, "stat", "fold")
+    lines = [line for line in values(device).splitlines() if "com.example.starts" in line]
+    right = 3 + (2 if done.returncode == 0 else 0)
+    if len(lines) != 1 or lines[0].split("\t")[3] != str(right):
+        raise Broken(f"it ended with {done.returncode}, and there is: {lines}")
+    said(done)
+
+
+def after_again(*command):
+    def check(device, reference, done):
+        said(done)
+        tool(device, *command)
+        if values(device) != wanted(values, reference):
+            raise Broken(f"statistics differ: {values(device)}; the program said: {done.stderr}")
+        if is_allowed(device) != wanted(is_allowed, reference):
+            raise Broken("the permission differs")
+        if filed(device) != wanted(filed, reference):
+            raise Broken(f"there are the logs {sorted(filed(device))}")
+    return check
+
+
+def filed(root):
+    """All that is kept for submission, by name."""
+    folder = (root / PENDING).parent
+    return {path.name: path.read_bytes() for path in folder.rglob("log-*")}
+
+
+def after_import(device, reference, done):
+    """All of a file, or nothing."""
+    said(done)
+    now, all_of_it = values(device), wanted(values, reference)
+    nothing = "\n".join(line for line in all_of_it.splitlines() if ".import." not in line)
+    if now != all_of_it and (done.returncode == 0 or now != nothing):
+        raise Broken(f"it ends with {done.returncode}, and there is: {now}")
+
+
+def after_set(device, _, done):
+    said(done)
+    now = tool(device, "prefs", "get", "com.example", "number").strip()
+    if now not in (["5"] if done.returncode == 0 else ["4", "5"]):
+        raise Broken(f"it ends with {done.returncode}, and there is: {now}")
+
+
+def is_allowed(root):
+    return '"allowed": true' in tool(root, "status", "--json")
+
+
+@functools.cache
+def undisturbed(reference, *command):
+    return MOMENT.sub("", run(reference, command)[0].stdout)
+
+
+def after_reading(_, reference, done):
+    said(done)
+    if done.returncode == 0 and (
+            MOMENT.sub("", done.stdout) != undisturbed(reference, *done.args_of)):
+        raise Broken(f"it ends with 0 and prints something else: {done.stdout}{done.stderr}")
+
+
+def after_statsd(device, reference, done):
+    said(done)
+    if done.returncode == 0 and not done.stderr and received(device) != wanted(received, reference):
+        raise Broken(f"statistics differ: {received(device)}")
+
+
+def received(root):
+    """What datagrams brought, without the second of the day."""
+    lines = (line.split("\t") for line in values(root).splitlines() if "statsd." in line)
+    return sorted(fields[:3] + fields[-1:] for fields in lines)
+
+
+def after_upload(device, reference, done):
+    said(done)
+    waiting = {path.name: path.read_bytes() for path in (device / PENDING).glob("*.log")}
+    outbox = device / PENDING.replace("pending", "outbox")
+    waiting |= {path.name: path.read_bytes() for path in outbox.glob("*.log")}
+    all_logs = {path.name: path.read_bytes() for path in (reference / "sent").glob("*.log")}
+    if {**waiting, **LogServer.kept} != all_logs:
+        raise Broken(f"of {sorted(all_logs)} there are {sorted(waiting)} on the device and "
+                     f"{sorted(LogServer.kept)} on the server; it said: {done.stderr}")
+    again, _ = run(device, done.args_of)
+    if again.returncode or LogServer.kept != all_logs:
+        raise Broken(f"the next run ends with {again.returncode}: {again.stderr}")
+
+
+def after_load(device, reference, done):
+    said(done)
+    again, _ = run(device, done.args_of)
+    if again.returncode or rows(device) != wanted(rows, reference):
+        raise Broken(f"the next load ends with {again.returncode}, and rows may differ: "
+                     f"{again.stderr}")
+
+
+def rows(root):
+    """All rows of all tables that docs/fleet-tables.md promises, with digests for numbers of logs."""
+    with contextlib.closing(sqlite3.connect(root / "fleet.db")) as tables:
+        tables.row_factory = sqlite3.Row
+        digest = {log: name for log, name in tables.execute("SELECT log, digest FROM logs")}
+        views = [name for name, in tables.execute("SELECT name FROM sqlite_master "
+                                                  "WHERE type = 'view'")]
+        return sorted(repr((view, [digest[value] if column == "log" else value
+                                   for column, value in zip(row.keys(), row)]))
+                      for view in views for row in tables.execute(f"SELECT * FROM {view}"))
+
+
+def said(done):
+    """A failure has a status and a line."""
+    if done.returncode not in (0, 1, 2, 75, 78):
+        raise Broken(f"it ends with {done.returncode}: {done.stderr}")
+    if done.returncode != 0 and not done.stderr.strip() and not done.can_be_silent:
+        raise Broken(f"it ends with {done.returncode} without a word")
