@@ -21,9 +21,9 @@ class HostileSegment : public Recording {
     EXPECT_EQ(pread(file_.get(), original_.data(), original_.size(), 0), 0xd0000);
   }
 
-  void write(std::uint64_t offset, std::uint64_t word, std::size_t size = 8) {
-    EXPECT_EQ(pwrite(file_.get(), &word, size, static_cast<off_t>(offset)),
-              static_cast<ssize_t>(size));
+  template <class Word>
+  void write(std::uint64_t offset, Word word) {
+    EXPECT_EQ(pwrite(file_.get(), &word, sizeof word, static_cast<off_t>(offset)), sizeof word);
   }
   void restore() {
     EXPECT_EQ(ftruncate(file_.get(), kBHSegmentBytes), 0);
@@ -61,39 +61,42 @@ TEST_F(HostileSegment, IsRefusedOrSkipped) {
   const std::uint64_t secondChunk = kBHChunks + kBHChunkBytes;
   const std::uint64_t key = SegmentFile(file_.get()).word64(kBHKeyTable + 8);
   const std::uint64_t mark = SegmentFile(file_.get()).word64(kBHChunks + kBHChunkFirst + 8);
-  const std::tuple<const char*, std::uint64_t, std::uint64_t, const char*> cases[] = {
-      {"nothing", kBHHeaderFolds, 0, "1 300 0"},
-      {"magic absent", kBHHeaderMagic, 0, "empty"},
-      {"magic", kBHHeaderMagic, 1, "not a segment"},
-      {"version", kBHHeaderVersion, 2, "a segment of version 2, not 1"},
-      {"size", kBHHeaderBytes, 4096, "a segment of a wrong size"},
-      {"chunks beyond", kBHHeaderCellsUsed, 0xffffffffffffffff, "1 300 0"},
-      {"no chunks, no cells", kBHHeaderCellsUsed, 0, "0 0 0"},
-      {"cell: not midnight", kBHCells, kToday * 86'400 + 1, "0 300 1"},
-      {"cell: day beyond 32 bits", kBHCells, 86'400ULL << 32, "0 300 1"},
-      {"cell: unused", kBHCells + kBHCellKey, 0, "0 300 0"},
-      {"cell: another kind", kBHCells + kBHCellKey, 2, "0 300 1"},
-      {"cell: key beyond", kBHCells + kBHCellKey, kBHKeys + 1, "0 300 1"},
-      {"key: absent", kBHKeyTable + 8, 0, "1 0 300"},
-      {"key: name beyond", kBHKeyTable + 8, key | (kBHNamesBytes - 3), "1 0 300"},
-      {"key: too long", kBHKeyTable + 8, key | 0x800'0000'0000, "1 0 300"},
-      {"key: empty", kBHKeyTable + 8, key & ~0xffff'0000'0000ULL, "1 0 300"},
-      {"key: kind", kBHKeyTable + 8, key ^ (1ULL << 48), "1 0 300"},
-      {"name: line break", kBHNames + 5, 0x0a0a0a0a0a0a0a0a, "1 0 300"},
-      {"name: not UTF-8", kBHNames + 5, 0xffffffffffffffff, "1 0 300"},
-      {"chunk: unused", secondChunk + kBHChunkGeneration, 0, "1 255 0"},
-      {"chunk: being emptied", secondChunk + kBHChunkGeneration, 3, "1 255 0"},
-      {"record: hole", kBHChunks + kBHChunkFirst + 8, 0, "1 299 0"},
-      {"record: key", kBHChunks + kBHChunkFirst + 8, mark | 0xffff, "1 299 1"},
-      {"record: latest", kBHChunks + kBHChunkFirst + 8, ~kBHUndated & ~0xfffdULL, "1 300 0"},
+  const std::tuple<const char*, std::uint64_t, int, std::uint64_t, const char*> cases[] = {
+      {"nothing", kBHHeaderFolds, 8, 0, "1 300 0"},
+      {"magic absent", kBHHeaderMagic, 8, 0, "empty"},
+      {"magic", kBHHeaderMagic, 8, 1, "not a segment"},
+      {"version", kBHHeaderVersion, 4, 2, "a segment of version 2, not 1"},
+      {"size", kBHHeaderBytes, 8, 4096, "a segment of a wrong size"},
+      {"chunks beyond", kBHHeaderCellsUsed, 8, 0xffffffffffffffff, "1 300 0"},
+      {"no chunks, no cells", kBHHeaderCellsUsed, 8, 0, "0 0 0"},
+      {"cell: not midnight", kBHCells, 8, kToday * 86'400 + 1, "0 300 1"},
+      {"cell: day beyond 32 bits", kBHCells, 8, 86'400ULL << 32, "0 300 1"},
+      {"cell: unused", kBHCells + kBHCellKey, 4, 0, "0 300 0"},
+      {"cell: another kind", kBHCells + kBHCellKey, 4, 2, "0 300 1"},
+      {"cell: key beyond", kBHCells + kBHCellKey, 4, kBHKeys + 1, "0 300 1"},
+      {"key: absent", kBHKeyTable + 8, 8, 0, "1 0 300"},
+      {"key: name beyond", kBHKeyTable + 8, 8, key | (kBHNamesBytes - 3), "1 0 300"},
+      {"key: too long", kBHKeyTable + 8, 8, key | 0x800'0000'0000, "1 0 300"},
+      {"key: empty", kBHKeyTable + 8, 8, key & ~0xffff'0000'0000ULL, "1 0 300"},
+      {"key: kind", kBHKeyTable + 8, 8, key ^ (1ULL << 48), "1 0 300"},
+      {"name: line break", kBHNames + 5, 8, 0x0a0a0a0a0a0a0a0a, "1 0 300"},
+      {"name: not UTF-8", kBHNames + 5, 8, 0xffffffffffffffff, "1 0 300"},
+      {"chunk: unused", secondChunk + kBHChunkGeneration, 4, 0, "1 255 0"},
+      {"chunk: being emptied", secondChunk + kBHChunkGeneration, 4, 3, "1 255 0"},
+      {"record: hole", kBHChunks + kBHChunkFirst + 8, 8, 0, "1 299 0"},
+      {"record: key", kBHChunks + kBHChunkFirst + 8, 8, mark | 0xffff, "1 299 1"},
+      {"record: latest", kBHChunks + kBHChunkFirst + 8, 8, ~kBHUndated & ~0xfffdULL, "1 300 0"},
   };
-  for (const auto& [what, offset, word, outcome] : cases) {
-    write(offset, word);
+  for (const auto& [what, offset, size, word, outcome] : cases) {
+    if (const auto half = static_cast<std::uint32_t>(word); size == 4)
+      write(offset, half);
+    else
+      write(offset, word);
     EXPECT_EQ(readAll(), outcome) << what;
     EXPECT_LE(positionBytes, 48 + 20 * scalars.size()) << what;
     restore();
   }
-  write(kBHChunks + kBHChunkFirst + 8, 0);
+  write(kBHChunks + kBHChunkFirst + 8, std::uint64_t{0});
   EXPECT_EQ(readAll(false), "1 45 0");  // it may still come
   EXPECT_EQ(positionBytes, 56U) << "a chunk of which nothing was taken";
   EXPECT_EQ(ftruncate(file_.get(), kBHChunks), 0);
