@@ -174,10 +174,11 @@ TEST_F(QuestionCommands, TellWhatChanged) {
 
 TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   load(file, 1);
-  const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 60).out;
-  EXPECT_THAT(shown, HasSubstr("\n              DEVICES  MINIMUM        MEAN  MAXIMUM  NO MEAN\n"
-                               "  (all)            40  "));
-  EXPECT_THAT(shown, HasSubstr("\n  \"(other)\"        13  "));
+  const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 64).out;
+  EXPECT_THAT(shown,
+              HasSubstr("\n                  DEVICES  MINIMUM        MEAN  MAXIMUM  NO MEAN\n"
+                        "  (all)                40  "));
+  EXPECT_THAT(shown, HasSubstr("\n  \"(other)\"            13  "));
   EXPECT_THAT(shown, HasSubstr("\n  (not reported)       13  "));
   EXPECT_THAT(shown, HasSubstr("\n  No room for STD DEVIATION, LOGS, VALUES, 25 %, 75 %, MINIMUM, "
                                "MAXIMUM, 5 %, 95 %: widen the terminal\n"));
