@@ -9,7 +9,6 @@ FOLDER has nand.ko and nandsim.ko, where the kernel lacks them. Ends with 1 when
 promise, or when there was no time to judge any.
 """
 
-import itertools
 import os
 import pathlib
 import random
@@ -83,13 +82,10 @@ class Chip:
         with open("/dev/mtd1", "r+b", buffering=0) as device:
             for number, name in enumerate(names):
                 block = self.blocks[name]
-                for erased, pages in itertools.groupby(
-                        range(0, BLOCK, PAGE),
-                        lambda start, block=block: block[start:start + PAGE] == ERASED):
-                    pages = list(pages)
-                    if not erased:
-                        first, end = pages[0], pages[-1] + PAGE
-                        os.pwrite(device.fileno(), block[first:end], number * BLOCK + first)
+                for start in range(0, BLOCK, PAGE):
+                    if block[start:start + PAGE] != ERASED:
+                        device.seek(number * BLOCK + start)
+                        device.write(block[start:start + PAGE])
 
 
 class Recorder:
