@@ -358,6 +358,37 @@ TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
   EXPECT_EQ(waitFor(child), 0);
 }
 
+TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
+  const pid_t child = start([] {
+    add(1);
+    kill(getpid(), SIGSTOP);
+  });
+  waitpid(child, nullptr, WUNTRACED);
+  foldNow();
+  LinuxPlatform device(DeviceRoot(root), {.log = &log});
+  const auto warning = [&] {
+    return RecordedHistory::open(DeviceRoot(root), device.store(), Recorders(), {.key = ""})
+        ->warning()
+        .value_or("");
+  };
+  EXPECT_EQ(warning(), "");
+  testClock().whenRead = [] {  // as a fold does
+    static timespec times[2];
+    ++times[1].tv_sec;
+    utimensat(AT_FDCWD, (getenv("TAVREL_ROOT") + std::string("/run/tavrel/fold.lock")).c_str(),
+              times, 0);
+  };
+  EXPECT_EQ(warning(),
+            "folds took values during each attempt to read them, and some are not shown: run it "
+            "again");
+  testClock().whenRead = nullptr;
+  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
+      .execute("UPDATE segments SET position = x'63000000'");  // of another version
+  EXPECT_EQ(warning(), "1 segments with values that wait are not shown: run 'tavrelctl stat fold'");
+  kill(child, SIGKILL);
+  waitFor(child);
+}
+
 TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
   const Gate later;
   const pid_t child = start([&] {  // its segment comes first

@@ -18,6 +18,7 @@ int __wrap_madvise(void* from, std::size_t bytes, int advice) {
 
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {
   const bool isReal = clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE;
+  if (auto* const whenRead = tavrel::testClock().whenRead.load(); isReal && whenRead) whenRead();
   const bool isBoot = clock == CLOCK_BOOTTIME;
   const bool isSteady = clock == CLOCK_MONOTONIC && tavrel::testClock().monotonic != 0;
   const std::int64_t seconds = isReal     ? tavrel::testClock().realtime.load()

@@ -783,6 +783,15 @@ class FailingReads {
   static inline bool andLater_ = false;
 };
 
+TEST_F(StoreTest, SaysWhenMemoryIsMissing) {
+  set({{"a", kToday, 1}});
+  sqlite3_hard_heap_limit64(1);
+  const auto batch = store_->beginBatch();
+  sqlite3_hard_heap_limit64(0);
+  ASSERT_FALSE(batch);
+  EXPECT_EQ(batch.error().message, where() + "out of memory: free some memory");
+}
+
 TEST_F(StoreTest, AFailingReadIsNoDamage) {
   for (int i = 0; i < 3; ++i) {
     set({{"k" + std::to_string(i), kToday, i}});

@@ -96,7 +96,8 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
     if (!SegmentFolder::isOutOfReach(root)) return folder.error();
     history.warning_ = folder.error().message + "; what waits to be folded is not shown";
   }
-  for (int attempt = 0; attempt < kAttempts; ++attempt) {
+  bool isOvertaken = true;
+  for (int attempt = 0; attempt < kAttempts && isOvertaken; ++attempt) {
     const timespec mark = FoldNotes::lastMark(root);
     auto stored = store.openHistory();
     if (stored) {
@@ -112,11 +113,15 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
         WaitingValues::read(**folder, recorders, history.stored_.get(), history.selection_);
     if (!waiting) return waiting.error();
     history.waiting_ = *std::move(waiting);
-    if (isSame(FoldNotes::lastMark(root), mark)) break;
+    isOvertaken = !isSame(FoldNotes::lastMark(root), mark);
   }
   if (const std::uint64_t leftOut = history.waiting_->leftOut(); leftOut > 0) {
     history.warning_ = std::to_string(leftOut) +
                        " segments with values that wait are not shown: run 'tavrelctl stat fold'";
+  }
+  if (isOvertaken) {
+    history.warning_ =
+        "folds took values during each attempt to read them, and some are not shown: run it again";
   }
   return history;
 }

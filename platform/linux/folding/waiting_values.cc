@@ -76,7 +76,10 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
     if (!stored) return stored.error();
     if (*stored) {
       auto decoded = SegmentPosition::decode(**stored);
-      if (!decoded) return Done{};
+      if (!decoded) {
+        ++leftOut_;
+        return Done{};
+      }
       position = *std::move(decoded);
       if (position.isEnd) return Done{};
     }

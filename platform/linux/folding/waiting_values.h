@@ -51,7 +51,8 @@ class WaitingValues {
 
   const RowMap<ScalarChanges::Change>& scalars() const { return scalars_.rows(); }
   const RowMap<Series>& distributions() const { return distributions_; }
-  /// Segments that were left out because of a limit.
+  /// Segments that were left out because of a limit, or because another version of this program
+  /// began to fold them.
   std::uint64_t leftOut() const { return leftOut_; }
 
   /// Measurements of the row from number `at` on, at most as many as fit; 0 at its end or on

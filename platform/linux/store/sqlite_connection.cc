@@ -44,6 +44,8 @@ Explanation explain(int code) {
       return {StoreFault::Device, kFreeSpace};
     case SQLITE_IOERR:
       return {StoreFault::Device, "check the file system that holds it"};
+    case SQLITE_NOMEM:
+      return {StoreFault::Other, "free some memory"};
     default:
       return {StoreFault::Other, "check the file system that holds it"};
   }
