@@ -863,6 +863,35 @@ TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
                 "(ulimit -n)");
 }
 
+TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {
+  for (int i = 0; i < 3; ++i)
+    run([] { add(1); });
+  std::ofstream(folder / "other");
+  auto opened = SegmentFolder::open(DeviceRoot(root));
+  const auto listing = (*opened)->list(3);
+  EXPECT_FALSE(listing->isWhole);
+  EXPECT_EQ(listing->refusals.at(0),
+            folder.string() +
+                " has more than 3 files: the rest is not folded; remove files that are not "
+                "segments");
+  EXPECT_TRUE((*opened)->list(4)->isWhole);
+
+  if (geteuid() == 0) {
+    ASSERT_EQ(seteuid(65534), 0);
+    const auto closed = (*opened)->openSegment((*opened)->list()->segments.at(0));
+    ASSERT_EQ(seteuid(0), 0);
+    const std::string name = segments().at(0).substr(folder.string().size() + 1);
+    EXPECT_EQ(closed->refusal,
+              "\"" + name + "\" in " + folder.string() +
+                  " is refused: Permission denied; let the user that folds read it");
+  }
+  const std::string elsewhere = "/tmp/tavrel-client-test";
+  std::filesystem::create_directories(elsewhere + "/run/tavrel/stat");
+  EXPECT_EQ(
+      SegmentFolder::open(DeviceRoot(elsewhere)).error().message,
+      elsewhere + "/run/tavrel/stat is not on a tmpfs: nothing is folded; mount a tmpfs there");
+}
+
 TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
   run([] { add(1); });
   const auto opened = SegmentFolder::open(DeviceRoot(root));

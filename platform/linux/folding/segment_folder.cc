@@ -33,6 +33,12 @@ bool isSystemsFailure(int code) {
   return code == EMFILE || code == ENFILE || code == ENOMEM || code == EIO;
 }
 
+// For a file that could not be opened or examined.
+std::string_view adviceFor(int code) {
+  return code == EACCES || code == EPERM ? "let the user that folds read it"
+                                         : "the next fold tries again";
+}
+
 // Why a file is no segment, judged from outside; nothing for one that may be.
 const char* faultOf(const struct stat& status, dev_t device) {
   if (S_ISLNK(status.st_mode)) return "a symbolic link";
@@ -79,7 +85,7 @@ Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& roo
     return systemError("examine", path);
   }
   if (fileSystem.f_type != TMPFS_MAGIC)
-    return Error{path + " is not on a tmpfs: nothing is folded"};
+    return Error{path + " is not on a tmpfs: nothing is folded; mount a tmpfs there"};
   return std::optional(SegmentFolder(std::move(path), std::move(folder), status.st_dev));
 }
 
@@ -90,7 +96,7 @@ bool SegmentFolder::isOutOfReach(const DeviceRoot& root) {
   return statfs(path.c_str(), &fileSystem) == 0 && fileSystem.f_type != TMPFS_MAGIC;
 }
 
-Expected<SegmentFolder::Listing> SegmentFolder::list() const {
+Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) const {
   Listing listing;
   const auto refuse = [&](std::string_view name, std::string_view reason) {
     if (listing.refusals.size() < limits::kListedRefusals) {
@@ -107,8 +113,12 @@ Expected<SegmentFolder::Listing> SegmentFolder::list() const {
   while (const dirent* const entry = readdir(folder.get())) {
     const std::string_view name = entry->d_name;
     if (name == "." || name == ".." || name == kRequest) continue;
-    if (++entries > limits::kSegmentFolderEntries) {
-      refuse(name, "the folder has too many files, and the rest is not looked at");
+    if (++entries > mostFiles) {
+      // First, because only some lines are logged.
+      listing.refusals.insert(listing.refusals.begin(),
+                              path_ + " has more than " + std::to_string(mostFiles) +
+                                  " files: the rest is not folded; remove files that are not "
+                                  "segments");
       listing.isWhole = false;
       break;
     }
@@ -145,8 +155,8 @@ Expected<SegmentFolder::Listing> SegmentFolder::list() const {
 }
 
 Expected<SegmentOpening> SegmentFolder::openSegment(const SegmentEntry& entry) const {
-  const auto refuse = [&](std::string_view reason) {
-    return SegmentOpening{std::nullopt, refusal(entry.name, reason)};
+  const auto refuse = [&](std::string_view reason, std::string_view advice = kRemoveIt) {
+    return SegmentOpening{std::nullopt, refusal(entry.name, reason, advice)};
   };
   OpenSegment segment{entry,
                       Descriptor(openat(folder_.get(), entry.name.c_str(),
@@ -155,10 +165,14 @@ Expected<SegmentOpening> SegmentFolder::openSegment(const SegmentEntry& entry) c
   if (!segment.file) {
     if (errno == ENOENT) return SegmentOpening();
     if (isSystemsFailure(errno)) return systemError("open", path_ + "/" + entry.name);
-    return refuse(errno == ELOOP ? "a symbolic link" : std::generic_category().message(errno));
+    if (errno == ELOOP) return refuse("a symbolic link");
+    return refuse(std::generic_category().message(errno), adviceFor(errno));
   }
   struct stat status {};
-  if (fstat(segment.file.get(), &status) != 0) return refuse("it cannot be examined");
+  if (fstat(segment.file.get(), &status) != 0) {
+    return refuse("it cannot be examined: " + std::generic_category().message(errno),
+                  adviceFor(errno));
+  }
   // Removed since it was listed.
   if (status.st_nlink == 0) return SegmentOpening();
   if (const char* const fault = faultOf(status, device_)) return refuse(fault);
@@ -187,10 +201,16 @@ bool SegmentFolder::remove(const OpenSegment& segment) const {
          unlinkat(folder_.get(), name, 0) == 0;
 }
 
-std::string SegmentFolder::refusal(std::string_view name, std::string_view reason) const {
+std::string SegmentFolder::refusal(std::string_view name, std::string_view reason,
+                                   std::string_view advice) const {
   std::string line;
   appendQuoted(line, name.substr(0, 80));
-  return line.append(" in ").append(path_).append(" is refused: ").append(reason) + "; remove it";
+  return line.append(" in ")
+      .append(path_)
+      .append(" is refused: ")
+      .append(reason)
+      .append("; ")
+      .append(advice);
 }
 
 Status SegmentFolder::clearRequest() const {

@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "base/expected.h"
+#include "base/limits.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/device_root.h"
 
@@ -57,8 +58,9 @@ class SegmentFolder {
     std::vector<std::string> refusals;  // lines for people
     bool isWhole = true;                // no entry of the folder was left unseen
   };
-  /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all.
-  Expected<Listing> list() const;
+  /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all, out of the first
+  /// `mostFiles`.
+  Expected<Listing> list(std::size_t mostFiles = limits::kSegmentFolderEntries) const;
 
   /// Opens a segment for reading. An error says that the system cannot do so now: nothing is known
   /// of the segment then.
@@ -68,8 +70,10 @@ class SegmentFolder {
   /// Removes the name, unless it belongs to another file by now.
   bool remove(const OpenSegment& segment) const;
 
-  /// The line, for people, about a file that is refused.
-  std::string refusal(std::string_view name, std::string_view reason) const;
+  static constexpr std::string_view kRemoveIt = "remove it";
+  /// The line, for people, about a file that is refused: why, and what to do.
+  std::string refusal(std::string_view name, std::string_view reason,
+                      std::string_view advice = kRemoveIt) const;
 
   /// Takes the request for a fold back. An error when that is impossible.
   Status clearRequest() const;
