@@ -389,6 +389,48 @@ TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
   waitFor(child);
 }
 
+TEST_F(FoldTest, ASeriesThatWaitsIsReadToItsEndOrFails) {
+  for (int round = 0; round < 3; ++round) {
+    run([=] {
+      for (int i = 0; i < 600; ++i)
+        record(round * 600 + i);
+    });
+  }
+  look(true);
+  expectEachOnce(1800);
+
+  LinuxPlatform device(DeviceRoot(root), {.log = &log});
+  const auto open = [&] {
+    return RecordedHistory::open(device.root(), device.store(), Recorders(),
+                                 {.key = "", .firstDay = INT32_MIN, .lastDay = INT32_MAX});
+  };
+  auto history = open();
+  for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
+    std::error_code isGone;
+    if (read_symlink(entry, isGone).string().starts_with("/memfd:waiting values"))
+      std::filesystem::resize_file(entry, 700 * sizeof(DistributionSample));
+  }
+  const Status walked = history->walkDistributions([](auto, auto, auto, auto& values, bool&) {
+    while (!values.nextValues().empty()) {
+    }
+    EXPECT_TRUE(values.failed());
+  });
+  ASSERT_FALSE(walked);
+  EXPECT_EQ(walked.error().message, "cannot read the copy of segments: Input/output error");
+
+  // The kernel writes what the limit leaves room for.
+  signal(SIGXFSZ, SIG_IGN);
+  rlimit sizes{};
+  getrlimit(RLIMIT_FSIZE, &sizes);
+  const rlimit few{700 * sizeof(DistributionSample), sizes.rlim_max};
+  setrlimit(RLIMIT_FSIZE, &few);
+  const auto none = open();
+  setrlimit(RLIMIT_FSIZE, &sizes);
+  signal(SIGXFSZ, SIG_DFL);
+  ASSERT_FALSE(none);
+  EXPECT_EQ(none.error().message, "cannot copy segments: File too large");
+}
+
 TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
   const Gate later;
   const pid_t child = start([&] {  // its segment comes first

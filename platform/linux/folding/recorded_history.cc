@@ -30,6 +30,9 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
                    const WaitingValues::Series& series)
       : stored_(stored), waiting_(waiting), series_(series) {}
 
+  /// Why values that wait could not be read.
+  const Status& status() const { return status_; }
+
  private:
   static constexpr std::size_t kAtOnce = 1024;
 
@@ -54,16 +57,21 @@ class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
       stored_ = nullptr;
     }
     std::array<DistributionSample, kAtOnce> samples;
-    const std::size_t count = waiting_.readSeries(series_, at_, samples);
-    at_ += count;
-    appendPacked(values_, offsets_, std::span(samples).first(count));
+    const auto count = waiting_.readSeries(series_, place_, samples);
+    if (!count) {
+      status_ = count.error();
+      fail();
+      return {};
+    }
+    appendPacked(values_, offsets_, std::span(samples).first(*count));
     return {values_, offsets_};
   }
 
   BHHistoryDistributionEnumerator* stored_;
   const WaitingValues& waiting_;
   const WaitingValues::Series& series_;
-  std::uint64_t at_ = 0;
+  WaitingValues::Series::Place place_;
+  Status status_ = Done{};
   std::string values_;
   std::string offsets_;
 };
@@ -171,11 +179,14 @@ Status RecordedHistory::walkDistributions(const SqliteHistory::CountedRowHandler
   const auto& rows = waiting_->distributions();
   auto next = rows.begin();
   bool isStopped = false;
+  Status status = Done{};
   const auto passNext = [&](std::int64_t storedCount, BHHistoryDistributionEnumerator* stored) {
     const WaitingValues::Series& series = next->second;
     JoinedEnumerator values(stored, *waiting_, series);
     rowHandler(next->first.second, next->first.first, storedCount + series.count, values,
                isStopped);
+    status = values.status();
+    if (!status) isStopped = true;
     ++next;
   };
   const auto passBefore = [&](const auto& isBefore) {
@@ -197,7 +208,7 @@ Status RecordedHistory::walkDistributions(const SqliteHistory::CountedRowHandler
         stop = isStopped;
       });
   if (walked) passBefore([](const RowName&) { return true; });
-  return walked;
+  return walked ? status : walked;
 }
 
 Expected<std::optional<SqliteHistory::DaySpan>> RecordedHistory::daysHeld() {

@@ -1,9 +1,11 @@
 #include "platform/linux/folding/waiting_values.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include "base/bytes.h"
 #include "base/limits.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/segments/segment_writer.h"
@@ -27,6 +29,27 @@ class SelectingSink final : public SegmentSink {
   const RowSelection& selection_;
   SegmentIntake& intake_;
 };
+
+Status writeAll(int file, ByteSpan bytes) {
+  while (!bytes.empty()) {
+    const ssize_t put = ::write(file, bytes.data(), bytes.size());
+    if (put < 0 && errno == EINTR) continue;
+    if (put < 0) return systemError("copy", "segments");
+    bytes = bytes.subspan(static_cast<std::size_t>(put));
+  }
+  return Done{};
+}
+
+Status readAll(int file, std::span<std::byte> into, std::uint64_t from) {
+  while (!into.empty()) {
+    const ssize_t got = pread(file, into.data(), into.size(), static_cast<off_t>(from));
+    if (got < 0 && errno == EINTR) continue;
+    if (got <= 0) return systemError("read", "the copy of segments", got < 0 ? errno : EIO);
+    into = into.subspan(static_cast<std::size_t>(got));
+    from += static_cast<std::uint64_t>(got);
+  }
+  return Done{};
+}
 
 }  // namespace
 
@@ -112,29 +135,29 @@ Status WaitingValues::addSeries(const RowSelection& selection, std::int32_t day,
                   packedOffsetAt(block.offsets.data() + i * kPackedOffsetBytes)};
   }
   const auto bytes = std::as_bytes(std::span(samples));
-  if (::write(copied_.get(), bytes.data(), bytes.size()) != std::ssize(bytes)) {
-    return systemError("copy", "segments");
-  }
+  if (Status done = writeAll(copied_.get(), bytes); !done) return done;
   series.blocks.push_back({copies_, count});
   copies_ += count;
   ++blocks_;
   return Done{};
 }
 
-std::size_t WaitingValues::readSeries(const Series& series, std::uint64_t at,
-                                      std::span<DistributionSample> into) const {
-  for (const Series::Block& block : series.blocks) {
-    if (at >= block.count) {
-      at -= block.count;
-      continue;
+Expected<std::size_t> WaitingValues::readSeries(const Series& series, Series::Place& place,
+                                                std::span<DistributionSample> into) const {
+  std::size_t count = 0;
+  while (count < into.size() && place.block < series.blocks.size()) {
+    const Series::Block& block = series.blocks[place.block];
+    const std::span<DistributionSample> part = into.subspan(
+        count, std::min<std::uint64_t>(block.count - place.offset, into.size() - count));
+    const std::uint64_t from = (block.first + place.offset) * sizeof(DistributionSample);
+    if (Status done = readAll(copied_.get(), std::as_writable_bytes(part), from); !done) {
+      return done.error();
     }
-    const std::span<DistributionSample> part =
-        into.first(std::min<std::uint64_t>(block.count - at, into.size()));
-    const auto offset = static_cast<off_t>((block.first + at) * sizeof(DistributionSample));
-    const ssize_t got = pread(copied_.get(), part.data(), part.size_bytes(), offset);
-    return got > 0 ? static_cast<std::size_t>(got) / sizeof(DistributionSample) : 0;
+    count += part.size();
+    place.offset += part.size();
+    if (place.offset == block.count) place = {place.block + 1, 0};
   }
-  return 0;
+  return count;
 }
 
 }  // namespace tavrel

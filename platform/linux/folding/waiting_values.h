@@ -40,6 +40,11 @@ class WaitingValues {
       std::uint64_t first;  // number of a measurement
       std::uint64_t count;
     };
+    /// Between two measurements: the block of the next one, and its number there.
+    struct Place {
+      std::size_t block = 0;
+      std::uint64_t offset = 0;
+    };
     std::vector<Block> blocks;
     std::int64_t count = 0;
   };
@@ -55,10 +60,10 @@ class WaitingValues {
   /// began to fold them.
   std::uint64_t leftOut() const { return leftOut_; }
 
-  /// Measurements of the row from number `at` on, at most as many as fit; 0 at its end or on
-  /// failure.
-  std::size_t readSeries(const Series& series, std::uint64_t at,
-                         std::span<DistributionSample> into) const;
+  /// The next measurements of the row, at most as many as fit; 0 at its end. Moves `place` behind
+  /// them.
+  Expected<std::size_t> readSeries(const Series& series, Series::Place& place,
+                                   std::span<DistributionSample> into) const;
 
  private:
   WaitingValues() = default;
