@@ -60,21 +60,7 @@ struct Connection::Transfer {
   }
 };
 
-Connection::Connection(const Configuration& configuration)
-    : configuration_(configuration),
-      shared_(nullptr, [](void* share) { curl_share_cleanup(share); }) {
-  if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
-  shared_.reset(curl_share_init());
-  if (!shared_ ||
-      curl_share_setopt(shared_.get(), CURLSHOPT_SHARE, CURL_LOCK_DATA_CONNECT) != CURLSHE_OK) {
-    throw std::bad_alloc();
-  }
-}
-
-Connection::~Connection() {
-  shared_.reset();
-  curl_global_cleanup();
-}
+Connection::Connection(const Configuration& configuration) : configuration_(configuration) {}
 
 Connection::Handle Connection::newHandle() const {
   const Configuration& configuration = configuration_;

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "base/expected.h"
+#include "http/curl_share.h"
 #include "upload/configuration.h"
 
 namespace tavrel::upload {
@@ -30,9 +31,6 @@ class Connection {
  public:
   /// Borrows `configuration`.
   explicit Connection(const Configuration& configuration);
-  ~Connection();
-  Connection(const Connection&) = delete;
-  Connection& operator=(const Connection&) = delete;
 
   /// Asked about once a second while a log is sent; false ends the transfer.
   using GoOn = std::function<bool()>;
@@ -52,10 +50,7 @@ class Connection {
   Handle newHandle() const;
 
   const Configuration& configuration_;
-  // What transfers share: the connection. Each has a handle of its own, because libcurl 7.88, used
-  // again, takes a folded line at the beginning of an answer's headers for part of the last
-  // header of the answer before, which it has freed.
-  std::unique_ptr<void, void (*)(void*)> shared_;
+  CurlShare shared_;
   bool isMisconfigured_ = false;
 };
 

@@ -98,21 +98,7 @@ struct Server::Transfer {
   }
 };
 
-Server::Server(ServerAddress address)
-    : address_(std::move(address)),
-      shared_(nullptr, [](void* share) { curl_share_cleanup(share); }) {
-  if (curl_global_init(CURL_GLOBAL_DEFAULT) != CURLE_OK) throw std::bad_alloc();
-  shared_.reset(curl_share_init());
-  if (!shared_ ||
-      curl_share_setopt(shared_.get(), CURLSHOPT_SHARE, CURL_LOCK_DATA_CONNECT) != CURLSHE_OK) {
-    throw std::bad_alloc();
-  }
-}
-
-Server::~Server() {
-  shared_.reset();
-  curl_global_cleanup();
-}
+Server::Server(ServerAddress address) : address_(std::move(address)) {}
 
 Server::Handle Server::newHandle() const {
   Handle owned(curl_easy_init(), curl_easy_cleanup);

@@ -9,6 +9,7 @@
 
 #include "fleet/engine/clickhouse/address.h"
 #include "fleet/engine/engine.h"
+#include "http/curl_share.h"
 
 namespace tavrel::fleet {
 
@@ -29,7 +30,6 @@ struct PassingError : EngineError {
 class Server {
  public:
   explicit Server(ServerAddress address);
-  ~Server();
 
   const ServerAddress& address() const { return address_; }
 
@@ -62,10 +62,7 @@ class Server {
 
   ServerAddress address_;
   std::string database_;
-  // The connection, which requests share. Each has a handle of its own, because libcurl 7.88, used
-  // again, takes a folded line at the beginning of an answer's headers for part of the last
-  // header of the answer before, which it has freed.
-  std::unique_ptr<void, void (*)(void*)> shared_;
+  CurlShare shared_;
 };
 
 /// `text` as a literal of the query language.
