@@ -10,9 +10,10 @@ from programs import Broken, LogServer, run, tool
 
 PENDING = "var/mobile/Library/Logs/Submission/pending"
 MOMENT = re.compile(r"<date>.*Z</date>")
-NOT_IN_THE_LOG = re.compile(" error (statistics store|cannot finish the daily log|cannot file log|"
-                            "cannot read|Couldn't load whitelist|Failed to write)")
-NAMED = re.compile(' distribution "([^"]*)"')
+NOT_IN_THE_LOG = re.compile("Z (error (statistics store|cannot finish the daily log|cannot file log|"
+                            "cannot read|Couldn't load whitelist|Failed to write)|"
+                            "default Couldn't allocate histCounts)")
+NAMED = re.compile(r' distribution "([^"]*)"|histCounts for key (\S+)\. ')
 
 
 def values(root):
@@ -50,7 +51,7 @@ def after_daily(device, reference, done):
     if 0 < len(found) <= 2 and all(log == right for log in found):
         return
     # What the log lacks is said, nothing in it is wrong, and a forced run files the whole one.
-    said_why = [line for line in errors_of(done) if NOT_IN_THE_LOG.search(line)]
+    said_why = [line for line in done.stderr.splitlines() if NOT_IN_THE_LOG.search(line)]
     wrong = [key for log in found for key in lacks_or_differs(log, right, said_why)]
     if not said_why or wrong:
         raise Broken(f"{len(found)} logs, different in {wrong}; the run said: {errors_of(done)}")
@@ -72,7 +73,7 @@ def errors_of(done):
 
 def lacks_or_differs(log, right, said_why):
     """The entries of a log that nobody said would be missing, or that are wrong."""
-    named = [match[1] for line in said_why if (match := NAMED.search(line))]
+    named = [match[1] or match[2] for line in said_why if (match := NAMED.search(line))]
     for group in sorted({*log, *right}):
         ours, theirs = log.get(group), right.get(group)
         if not isinstance(theirs, dict):
