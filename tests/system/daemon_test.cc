@@ -238,7 +238,7 @@ TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
   EXPECT_FALSE(std::filesystem::exists(none));
 }
 
-TEST(HealthProgramTest, SaysWhatItCannotReadOrWrite) {
+TEST(HealthProgramTest, SaysWhatItCannotRead) {
   const TemporaryRoot device;
   const std::string errors = device.root.path("/errors");
   const auto run = [&](const std::string& root, int status) {
@@ -256,12 +256,10 @@ TEST(HealthProgramTest, SaysWhatItCannotReadOrWrite) {
                               "TAVREL_ROOT\n");
   EXPECT_EQ(run(device.root.path("/"), 0), "");
   const std::string memory = device.root.path("/var/lib/tavrel/health/memory.plist");
-  EXPECT_TRUE(std::filesystem::remove(memory));
   std::filesystem::create_directories(memory);
-  EXPECT_EQ(run(device.root.path("/"), 1),
-            "error cannot use remembered counters " + memory + ", starting again: cannot use " +
-                memory + ": it is a folder; move it away\n" +
-                "error cannot keep counters: cannot put in place " + memory + ": Is a directory\n");
+  EXPECT_EQ(run(device.root.path("/"), 0), "error cannot use remembered counters " + memory +
+                                               ", starting again: cannot use " + memory +
+                                               ": it is a folder; move it away\n");
 }
 
 TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
