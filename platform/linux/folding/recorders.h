@@ -29,9 +29,9 @@ class Recorders {
   /// Nobody is listed.
   Recorders() = default;
 
-  /// What /etc/tavrel/recorders.plist says. A file that is damaged, that users other than root and this
-  /// user could have written, or that is a link that leads nowhere, counts as absent, with a line
-  /// in the log; so does each entry that is not understood.
+  /// What /etc/tavrel/recorders.plist says. A file that is damaged, that users other than root and
+  /// this user could have written, or that is a link that leads nowhere, counts as absent, with a
+  /// line in the log; so does each entry that is not understood.
   static Recorders read(const DeviceRoot& root, FileSystem& files,
                         PropertyListCoding& propertyLists, SystemLog& log);
 
