@@ -1,0 +1,100 @@
+// A device on which programs record and folds run.
+#pragma once
+
+#include <algorithm>
+#include <cstdlib>
+#include <set>
+#include <sys/stat.h>
+
+#include "platform/linux/folding/recorded_history.h"
+#include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_store.h"
+#include "platform/platform.h"
+#include "recording.h"
+
+namespace tavrel {
+
+using Lines = std::vector<std::string>;
+
+inline int fromEnvironment(const char* name, int otherwise) {
+  const char* const text = std::getenv(name);  // for long runs by hand
+  return text ? static_cast<int>(std::strtol(text, nullptr, 10)) : otherwise;
+}
+
+/// Folds into the store of the device, and looks at what it holds.
+class FoldTest : public Recording {
+ protected:
+  struct KeptLog final : SystemLog {
+    void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
+    Lines lines;
+  };
+
+  FoldTest() {
+    chmod(root.c_str(), 0755);
+    chmod(folder.c_str(), 01777);
+  }
+
+  FoldReport foldNow() {
+    log.lines.clear();
+    LinuxPlatform device(DeviceRoot(root), {.log = &log});
+    SqliteStore impatient(device.root(), device.platform().clock, device.platform().preferences,
+                          log, 20);
+    return SegmentFold(device.root(), impatient, device.fileSystem(),
+                       device.platform().propertyLists, log)
+        .run();
+  }
+  /// What the store holds, and what waits too if wanted.
+  void look(bool alsoWaiting = false) {
+    scalars.clear();
+    records.clear();
+    std::set<std::int32_t> days;
+    KeptLog own;
+    LinuxPlatform device(DeviceRoot(root), {.log = &own});
+    const DeviceRoot place(alsoWaiting ? root.string() : "/nowhere");
+    auto history = RecordedHistory::open(place, device.store(), Recorders(),
+                                         {.key = "", .firstDay = INT32_MIN, .lastDay = INT32_MAX});
+    ASSERT_TRUE(history) << history.error().message;
+    ASSERT_TRUE(history->walkScalars([&](auto key, auto day, auto value, bool&) {
+      EXPECT_TRUE(scalars.emplace(std::pair(key, day), value).second) << key;
+      days.insert(day);
+    }));
+    ASSERT_TRUE(
+        history->walkDistributions([&](auto key, auto day, auto count, auto& values, bool&) {
+          days.insert(day);
+          double value = 0;
+          std::uint32_t second = 0;
+          auto& row = records[std::string(key)];
+          const std::size_t before = row.size();
+          while (values.getNextValue(value, second))
+            row.push_back(value);
+          EXPECT_EQ(row.size() - before, static_cast<std::size_t>(count)) << key;
+        }));
+    const auto held = history->daysHeld();
+    ASSERT_TRUE(held && held->has_value() == !days.empty());
+    if (!*held) return;
+    EXPECT_EQ(std::pair((*held)->first, (*held)->last), std::pair(*days.begin(), *days.rbegin()));
+  }
+  std::int64_t figure(const char* name) {
+    const std::string key = std::string("com.norvane.brimhold.") + name;
+    std::int64_t sum = 0;  // under the day of the machine's clock
+    for (const auto& [row, value] : scalars)
+      if (row.first == key) sum += value;
+    return sum;
+  }
+  /// All numbers from 0 up.
+  void expectEachOnce(std::size_t count) {
+    auto& values = records["series"];
+    std::sort(values.begin(), values.end());
+    ASSERT_EQ(values.size(), count);
+    std::size_t wrong = 0;
+    for (std::size_t i = 0; i < count; ++i)
+      if (values[i] != static_cast<double>(i)) ++wrong;
+    ASSERT_EQ(wrong, 0U);
+  }
+  std::filesystem::path store() { return LinuxPlatform(DeviceRoot(root)).store().path(); }
+
+  KeptLog log;
+};
+
+}  // namespace tavrel
