@@ -129,7 +129,7 @@ void readMachine(fuzz::Input& input, unsigned without) {
 
 }  // namespace
 
-// For libatasmart, which compiles the names of drives with quirks anew for each drive that it
+// For libatasmart, which compiles the names of drives with quirks again for each drive that it
 // opens; that takes longer than all the rest.
 extern "C" int regcomp(regex_t* made, const char* pattern, int flags) {
   static std::map<std::pair<std::string, int>, regex_t> known;
