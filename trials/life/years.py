@@ -55,13 +55,13 @@ class Years(Mishaps):
             self.clock.go_to(day * SECONDS_PER_DAY + second)
             if self.repair_clock_at is not None and self.clock.true >= self.repair_clock_at:
                 self.repair_clock()
-            if self.clock.wrong:
-                self.wrong.add(day)
             self.activity()
             if number == happens_at:
                 for name in today:
                     took_place = getattr(self, name)() is not False
                     self.count(f"event {name}" if took_place else f"event {name}, in vain")
+            if self.clock.wrong:
+                self.wrong.add(day)
             if number == runs_at:
                 self.daily_run()
             if chance.random() < 0.5:
