@@ -333,6 +333,18 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
   std::filesystem::remove_all("/tmp/tavrel-client-test");
 }
 
+TEST_F(Recording, TimersMeasureSecondsAndMilliseconds) {
+  run([] {
+    record(0);
+    testClock().monotonic = 1;
+    const BHClientTimer timer = BHClientTimerStart();
+    BHClientTimerStopSeconds(timer, keys().series);
+    BHClientTimerStopMilliseconds(timer, keys().series);
+  });
+  fold();
+  EXPECT_EQ(records["series"], (std::vector<double>{0, 10.1, 20'200}));
+}
+
 TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
   run([] {
     EXPECT_EQ(BHClientScalarForKey("a"), BHClientScalarForKey(std::string("a").c_str()));
