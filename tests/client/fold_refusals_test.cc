@@ -337,7 +337,7 @@ TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
 TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {
   for (int i = 0; i < 3; ++i)
     run([] { add(1); });
-  std::ofstream(folder / "other");
+  const std::ofstream other(folder / "other");
   auto opened = SegmentFolder::open(DeviceRoot(root));
   const auto listing = (*opened)->list(3);
   EXPECT_FALSE(listing->isWhole);
