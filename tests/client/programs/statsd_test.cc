@@ -102,6 +102,8 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   auto unixSocket = openUnixSocket(path);
   auto loopback = openLoopbackSocket(0);
   ASSERT_TRUE(unixSocket && loopback);
+  EXPECT_EQ(std::filesystem::status(path).permissions(), std::filesystem::perms{0666})
+      << "every user may send";
   sockaddr_in address{};
   socklen_t size = sizeof address;
   getsockname(loopback->descriptor(), reinterpret_cast<sockaddr*>(&address), &size);
