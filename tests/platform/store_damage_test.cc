@@ -1,0 +1,344 @@
+#include <map>
+#include <set>
+
+#include "platform/linux/store/kept_values.h"
+#include "platform/store_path.h"
+#include "store_fixture.h"
+
+namespace tavrel {
+namespace {
+
+TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
+  auto batch = store_->beginBatch();
+  ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 1, 1));
+  ASSERT_TRUE((*batch)->appendValue(kToday, "good", 2, 2));
+  ASSERT_TRUE((*batch)->commit());
+  batch->reset();
+  settle();
+  const std::string whole = contentOf(store_->path());
+  const std::string ofBad = " WHERE key = CAST('bad' || char(10) AS BLOB)";
+  // Whether a writer may append: it reads the row, but not the chunks.
+  const std::tuple<std::string, std::string, bool> cases[] = {
+      {"UPDATE chunks SET data = x'00' WHERE chunk = 0",
+       "its values are not in the form that this program writes", true},
+      {"DELETE FROM chunks WHERE chunk = 0", "it does not hold the 1 values that it counts", true},
+      {"UPDATE chunks SET data = zeroblob(16) WHERE chunk = 0",
+       "it does not hold the 1 values that it counts", true},
+      {"DELETE FROM chunks WHERE chunk = 1", "it does not hold the 1 values that it counts", true},
+      {"UPDATE chunks SET data = x'00' WHERE chunk = 1",
+       "its values are not in the form that this program writes", true},
+      {"UPDATE distributions SET count = 2" + ofBad, "it does not hold the 2 values that it counts",
+       false},
+      {"UPDATE distributions SET count = 0, runs = x''" + ofBad,
+       "it does not hold the 0 values that it counts", false},
+      {"UPDATE distributions SET count = -1" + ofBad,
+       "it does not hold the -1 values that it counts", false},
+      {"UPDATE distributions SET runs = x'000180'" + ofBad, "it refers to values that cannot exist",
+       false},
+      {"UPDATE distributions SET runs = x'FEFFFFFFFFFFFFFF7F0201'" + ofBad,
+       "it refers to values that cannot exist", false},
+      {"UPDATE chunks SET data = zeroblob(8 * 1025) WHERE chunk = 0",
+       "its values are not in the form that this program writes", true}};
+  for (const auto& [change, reason, takesMore] : cases) {
+    SCOPED_TRACE(change);
+    settle();
+    write(kStorePath, whole);
+    sql(change);
+    log.lines.clear();
+    const auto history = store_->openHistory();
+    Lines seen;
+    const auto see = [&](std::string_view key, BHHistoryDistributionEnumerator& values) {
+      const auto size = take(values).size();
+      seen.push_back(std::string(key) + std::to_string(size) + (values.failed() ? " failed" : ""));
+    };
+    const auto walk = [&](std::string_view unread) {
+      const auto handler = [&](auto key, auto, auto, auto& values, auto&) {
+        if (key != unread) see(key, values);
+      };
+      return (*history)->walkDistributions("", kFirstDay, kLastDay, handler);
+    };
+    EXPECT_TRUE(walk("bad\n"));
+    const std::string line = where() + "distribution \"bad\\n\" of day 20784: " + reason +
+                             ": restore the file from a copy or move it away";
+    EXPECT_EQ(walk("").error().message, line);
+    (*history)->distributionsForKeyPrefix(
+        "", kToday - 1, kToday, [&](auto key, auto, auto& values, auto&) { see(key, values); });
+    const std::string bad = "bad\n0 failed";
+    EXPECT_EQ(seen, (Lines{"good1", bad, "good1", bad, "good1"}));
+    EXPECT_EQ(log.lines, Lines{line});
+    batch = store_->beginBatch();
+    ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 3, 3));
+    EXPECT_EQ(static_cast<bool>((*batch)->commit()), takesMore);
+    batch->reset();
+  }
+  settle();
+  write(kStorePath, whole);
+  sql("UPDATE distributions SET count = 2, runs = x'000202'" + ofBad);
+  EXPECT_EQ((*store_->openHistory())
+                ->walkDistribution("bad\n", kFirstDay, kLastDay,
+                                   [&](auto, auto, auto, auto& values, auto&) { take(values); })
+                .error()
+                .message,
+            where() +
+                "distribution \"bad\\n\" of day 20784: it does not hold the 2 values that it "
+                "counts: restore the file from a copy or move it away");
+  sql("DELETE FROM chunks");
+  EXPECT_TRUE((*store_->openHistory())
+                  ->walkDistributions("", kFirstDay, kLastDay,
+                                      [&](auto, auto, auto, auto& values, auto&) { take(values); })
+                  .error()
+                  .message.ends_with("; 1 more could not be read whole"));
+  EXPECT_EQ(corruptions(), 0);
+}
+
+TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
+  const std::string kept = store_->path() + "-kept";
+  set({{"k", kToday, 1}});
+  const auto impatient = open(1);
+  const auto keep = [&](const char* key, std::int64_t value, bool commits = false) {
+    auto writer = store_->beginBatch();
+    EXPECT_TRUE((*writer)->addScalar(kToday, "lock", 1));
+    impatient->BHClientSetValueForScalarKey(key, value);
+    EXPECT_TRUE(impatient->BHClientCheckpoint());
+    EXPECT_TRUE(!commits || (*writer)->commit());
+  };
+  keep("k", 2);
+  keep("j", 3);
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 1}}));
+  EXPECT_EQ(FileSystem::status(kept)->st_mode & 0777U, 0640U);
+  const std::string content = contentOf(kept);
+  set({{"k", kToday, 4}});
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 3}, {"k", kToday, 4}}));
+  EXPECT_FALSE(std::filesystem::exists(kept));
+
+  // As a kill between the commit and the removal leaves it; more is kept before it is seen.
+  write(std::string(kStorePath) + "-kept", content);
+  keep("j", 5);
+  store_->BHClientCheckpoint();
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 5}, {"k", kToday, 4}}));
+  EXPECT_FALSE(std::filesystem::exists(kept));
+
+  for (std::size_t i = 0; i < content.size(); i += 7) {
+    std::string damaged = content;
+    damaged[i] = static_cast<char>(damaged[i] ^ 1);
+    write(std::string(kStorePath) + "-kept", i == 0 ? "cut" : damaged);
+    store_->BHClientCheckpoint();
+    EXPECT_EQ(log.lines.back(), "values kept in " + kept +
+                                    " are lost: the file is damaged; it is now " + kept +
+                                    "-damaged");
+    EXPECT_FALSE(std::filesystem::exists(kept));
+    EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 5}, {"k", kToday, 4}}));
+  }
+  // What cannot be read is not replaced.
+  std::filesystem::create_directory(kept);
+  EXPECT_FALSE(KeptValues(store_->path()).add({{0, kToday, 1, "d"}}));
+  EXPECT_TRUE(std::filesystem::is_directory(kept));
+  std::filesystem::remove(kept);
+  for (const char value : {'a', 'b', 'c'})
+    keep(std::string(400'000, value).c_str(), 1);
+  EXPECT_TRUE(log.says(kept + " is full: the 1 earliest values are dropped"));
+  store_->BHClientCheckpoint();
+  EXPECT_EQ(scalarsOfToday().size(), 4U);
+
+  // What is kept between taking values in and their commit is not lost with them.
+  keep("j", 6);
+  keep("j", 7, true);
+  EXPECT_TRUE(std::filesystem::exists(kept));
+  store_->BHClientCheckpoint();
+  EXPECT_EQ(scalarsOfToday().at(2).value, 7);
+}
+
+TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
+  set({{"old", kToday, 1}});
+  for (int i = 0; i < 500; ++i)
+    store_->BHClientSetValueForScalarKey("k" + std::to_string(i), i);
+  store_->BHClientCheckpoint();
+  settle();
+  const std::string good = contentOf(store_->path());
+  sql("CREATE TABLE more (x); PRAGMA user_version = 3");
+  const std::string later = contentOf(store_->path());
+  std::filesystem::remove(store_->path());
+  sql("CREATE TABLE theirs (x)");
+  const std::string foreign = contentOf(store_->path());
+
+  std::string flipped = good.substr(0, 4096) + std::string(good.size() - 4096, 'x');
+  const std::tuple<const char*, std::string, bool, const char*> cases[] = {
+      {"empty", "", false, nullptr},
+      {"good", good, false, nullptr},
+      {"garbage", std::string(10'000, 'x'), true, "file is not a database"},
+      {"two bytes", "SQ", true, "file is not a database"},
+      {"half a page", good.substr(0, 300), true, "database disk image is malformed"},
+      {"cut", good.substr(0, good.size() / 2), true, "database disk image is malformed"},
+      {"flipped", flipped, true, "database disk image is malformed"},
+      {"later", later, false,
+       "has schema version 3, which this program does not know (it knows 1 and 2), and is left "
+       "alone: "
+       "update tavrel, or move the file away"},
+      {"foreign", foreign, false,
+       "holds the tables of another program and is left alone: move it away"}};
+  for (const auto& [name, content, damaged, reason] : cases) {
+    for (const bool byReader : {true, false}) {
+      SCOPED_TRACE(std::string(name) + (byReader ? ", read" : ", written"));
+      store_ = open();
+      std::filesystem::remove_all(std::filesystem::path(store_->path()).parent_path());
+      write(kStorePath, content);
+      log.lines.clear();
+      preferences.ZTXPreferencesSetValue("DatabaseCorruptionCount", {}, "com.norvane.tallied");
+
+      if (byReader) {
+        scalarsOfToday();
+      } else {
+        store_->BHClientSetValueForScalarKey("new", 1);
+        store_->BHClientCheckpoint();
+      }
+      const std::string aside = store_->path() + ".corrupt-20261127T180218Z";
+      EXPECT_EQ(setAsideFiles(), damaged ? Lines{aside} : Lines{});
+      EXPECT_EQ(corruptions(), damaged ? 1 : 0);
+      if (damaged) {
+        ASSERT_EQ(log.lines.size(), byReader ? log.lines.size() : 1U);
+        EXPECT_EQ(log.lines[0], where() + reason + ": the file has to be set aside; it is now " +
+                                    aside + " and a new store begins: inspect or remove that file");
+        EXPECT_EQ(contentOf(aside), content);
+      } else if (reason) {
+        scalarsOfToday();
+        store_->BHClientCheckpoint();
+        EXPECT_EQ(log.lines, Lines{where() + reason +
+                                   (byReader ? "" : "; 1 value waits for the next commit")});
+        EXPECT_EQ(contentOf(store_->path()), content);
+      }
+      EXPECT_TRUE(store_->commit()) << "or kept";
+    }
+  }
+  // What was set while the store was another program's is still there for a store of our own.
+  std::filesystem::remove(store_->path());
+  EXPECT_TRUE(store_->commit());
+  EXPECT_EQ(scalarsOfToday(), (Rows{{"new", kToday, 1}}));
+
+  // Who finds the damage second does not set the new store aside.
+  const StoreSite site{store_->path(), std::make_shared<BusyBudget>(1), clock, preferences, log};
+  EXPECT_FALSE(site.setAside(FileIdentity{1, 1}, {StoreFault::Damaged, "damaged"}));
+  EXPECT_EQ(scalarsOfToday().size(), 1U);
+
+  const std::string elsewhere = root.path("/elsewhere");
+  std::ofstream(elsewhere).close();
+  const auto link = [&](const char* path) { return symlink(elsewhere.c_str(), path); };
+  const auto pipe = [](const char* path) { return mkfifo(path, 0600); };
+  const auto folder = [](const char* path) { return mkdir(path, 0700); };
+  const std::pair<std::function<int(const char*)>, const char*> kObstacles[] = {
+      {link, "is a symbolic link"},
+      {pipe, "is not a regular file"},
+      {folder, "is not a regular file"}};
+  for (const auto& [make, what] : kObstacles) {
+    std::filesystem::remove(store_->path());
+    ASSERT_EQ(make(store_->path().c_str()), 0);
+    log.lines.clear();
+    store_ = open();
+    EXPECT_EQ(scalarsOfToday(), Rows{});
+    store_->BHClientSetValueForScalarKey("k", 1);
+    EXPECT_TRUE(store_->commit()) << "kept";
+    EXPECT_EQ(log.lines, Lines{where() + what + ": move it away"});
+  }
+  EXPECT_EQ(contentOf(elsewhere), "");
+}
+
+/// While it lives, one read of SQLite fails, or all from it on.
+class FailingReads {
+ public:
+  FailingReads(int at, bool andLater) {
+    system_ = sqlite3_vfs_find("unix");
+    vfs_ = *system_;
+    vfs_.zName = "failing";
+    vfs_.xOpen = open;
+    at_ = at;
+    andLater_ = andLater;
+    reads_ = 0;
+    sqlite3_vfs_register(&vfs_, 1);
+  }
+  ~FailingReads() {
+    sqlite3_vfs_unregister(&vfs_);
+    sqlite3_vfs_register(system_, 1);
+  }
+  static bool hasFailed() { return reads_ >= at_; }
+
+ private:
+  static int open(sqlite3_vfs*, const char* name, sqlite3_file* file, int flags, int* outFlags) {
+    const int code = system_->xOpen(system_, name, file, flags, outFlags);
+    if (code != SQLITE_OK) return code;
+    read_ = file->pMethods->xRead;
+    sqlite3_io_methods& methods =
+        methods_.try_emplace(file->pMethods, *file->pMethods).first->second;
+    methods.xRead = read;
+    file->pMethods = &methods;
+    return code;
+  }
+  static int read(sqlite3_file* file, void* into, int size, sqlite3_int64 offset) {
+    ++reads_;
+    const bool fails = reads_ == at_ || (andLater_ && reads_ > at_);
+    // What SQLite makes of EIO. Statements turn it into SQLITE_CORRUPT.
+    return fails ? SQLITE_IOERR_CORRUPTFS : read_(file, into, size, offset);
+  }
+
+  static inline sqlite3_vfs* system_ = nullptr;
+  static inline sqlite3_vfs vfs_{};
+  // The database's and the log's.
+  static inline std::map<const sqlite3_io_methods*, sqlite3_io_methods> methods_;
+  static inline decltype(sqlite3_io_methods::xRead) read_ = nullptr;
+  static inline int at_ = 0, reads_ = 0;
+  static inline bool andLater_ = false;
+};
+
+TEST_F(StoreTest, SaysWhenMemoryIsMissing) {
+  set({{"a", kToday, 1}});
+  sqlite3_hard_heap_limit64(1);
+  const auto batch = store_->beginBatch();
+  sqlite3_hard_heap_limit64(0);
+  ASSERT_FALSE(batch);
+  EXPECT_EQ(batch.error().message, where() + "out of memory: free some memory");
+}
+
+TEST_F(StoreTest, AFailingReadIsNoDamage) {
+  for (int i = 0; i < 3; ++i) {
+    set({{"k" + std::to_string(i), kToday, i}});
+    auto batch = store_->beginBatch();
+    ASSERT_TRUE((*batch)->appendValue(kToday, "d", 1, i) && (*batch)->commit());
+  }
+  const auto readAll = [&] {
+    const auto history = store_->initWithDefaultPath();
+    std::size_t found = scalars(*history, "k", kToday - 1, kToday).size();
+    history->distributionsForKeyPrefix(
+        "", kToday - 1, kToday,
+        [&](auto, auto, auto& values, auto&) { found += take(values).size(); });
+    return found;
+  };
+  std::set<std::string> said;
+  for (const bool writes : {false, true}) {
+    for (const bool andLater : {false, true}) {
+      for (int at = 1, hasFailed = 1; hasFailed != 0; ++at) {
+        SCOPED_TRACE(std::to_string(at) + (andLater ? "+" : "") + (writes ? ", written" : ""));
+        log.lines.clear();
+        {
+          const FailingReads reads(at, andLater);
+          store_ = open();
+          if (writes) store_->BHClientSetValueForScalarKey("w", at);
+          if (writes) store_->BHClientCheckpoint();
+          const std::size_t found = writes ? 6 : readAll();
+          EXPECT_TRUE(found == 6 || !log.lines.empty()) << found;
+          hasFailed = FailingReads::hasFailed();
+        }
+        said.insert(log.lines.begin(), log.lines.end());
+        EXPECT_EQ(setAsideFiles(), Lines{});
+        store_->BHClientCheckpoint();
+        EXPECT_EQ(readAll(), 6U);
+        EXPECT_EQ(scalars(*store_->initWithDefaultPath(), "w", kToday - 1, kToday),
+                  writes ? Rows({{"w", kToday, at}}) : Rows{});
+      }
+    }
+  }
+  EXPECT_EQ(corruptions(), 0);
+  EXPECT_TRUE(said.contains(where() + "looked damaged, but a second look found it sound: check "
+                                      "the file system that holds it, and the memory that is "
+                                      "free"));
+}
+
+}  // namespace
+}  // namespace tavrel
