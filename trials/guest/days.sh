@@ -88,6 +88,11 @@ expect "samples of the measured day" "$taken" \
 import json, sys
 days = json.load(sys.stdin)["scalar"]["days"]
 print(*[day["value"] for day in days if day["date"] == "2037-11-22"])')"
+expect "the health of the guest's drive" "nvme0 QEMU NVMe Ctrl good 49850" \
+  "$(tavrelctl disks --json | python3 -c '
+import json, sys
+for disk in json.load(sys.stdin)["disks"]:
+    print(disk["name"], disk["model"], disk["verdict"], disk["figures"]["temperature"])')"
 systemctl start tavrel-sampler.service
 expect "no unit failed" "" "$(systemctl list-units --no-legend --plain --state=failed 'tavrel*')"
 note "CPU time of a sample: $sample_used us of the sampler, $start_used us with a start of its \
