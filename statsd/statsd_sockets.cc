@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
 #include <memory>
@@ -14,13 +13,12 @@
 #include <sys/un.h>
 #include <unistd.h>
 
+#include "base/activated_descriptors.h"
 #include "base/format.h"
-#include "base/parse_number.h"
 
 namespace tavrel {
 namespace {
 
-constexpr int kFirstDescriptor = 3;
 constexpr int kMostSockets = 16;
 
 // Datagrams per system call.
@@ -28,13 +26,6 @@ constexpr unsigned kBatch = 32;
 
 // Bytes that the kernel keeps while the program is busy or starts. It grants what its limit allows.
 constexpr int kReceiveBuffer = 1 << 20;
-
-std::optional<int> numberFromEnvironment(const char* variable) {
-  const char* const text = std::getenv(variable);
-  if (text == nullptr) return std::nullopt;
-  const auto number = parseNumber<int>(text);
-  return number && *number > 0 ? number : std::nullopt;
-}
 
 bool isDatagramSocket(int descriptor) {
   int type = 0;
@@ -125,13 +116,12 @@ DatagramSocket::~DatagramSocket() {
 
 Expected<std::vector<DatagramSocket>> activatedDatagramSockets() {
   std::vector<DatagramSocket> sockets;
-  const auto process = numberFromEnvironment("LISTEN_PID");
-  const auto count = numberFromEnvironment("LISTEN_FDS");
-  if (!process || *process != getpid() || !count) return sockets;
-  if (*count > kMostSockets) {
-    return Error{format("LISTEN_FDS passes %d sockets: pass at most %d", *count, kMostSockets)};
+  const int count = activatedDescriptors(getpid());
+  if (count > kMostSockets) {
+    return Error{format("LISTEN_FDS passes %d sockets: pass at most %d", count, kMostSockets)};
   }
-  for (int descriptor = kFirstDescriptor; descriptor < kFirstDescriptor + *count; ++descriptor) {
+  for (int i = 0; i < count; ++i) {
+    const int descriptor = kFirstActivatedDescriptor + i;
     if (!isDatagramSocket(descriptor)) {
       return Error{
           format("descriptor %d of LISTEN_FDS is not a datagram socket: use "

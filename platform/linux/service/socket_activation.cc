@@ -4,28 +4,17 @@
 #include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
-#include <optional>
 #include <string>
 #include <sys/socket.h>
 #include <unistd.h>
 #include <vector>
 
+#include "base/activated_descriptors.h"
 #include "base/limits.h"
-#include "base/parse_number.h"
 
 namespace tavrel {
 
 namespace {
-
-/// The first descriptor from the service manager, after the standard streams.
-constexpr int kFirstDescriptor = 3;
-
-std::optional<int> numberFromEnvironment(const char* variable) {
-  const char* text = std::getenv(variable);
-  if (!text) return std::nullopt;
-  const auto number = parseNumber<int>(text);
-  return number && *number > 0 ? number : std::nullopt;
-}
 
 std::vector<std::string> namesFromEnvironment() {
   std::vector<std::string> names;
@@ -55,11 +44,10 @@ bool isListeningPacketSocket(int descriptor) {
 }  // namespace
 
 Descriptor activatedSocket(std::string_view name, SystemLog& log) {
-  const auto process = numberFromEnvironment("LISTEN_PID");
-  const auto count = numberFromEnvironment("LISTEN_FDS");
-  if (!process || *process != getpid() || !count) return {};
-  if (*count > limits::kActivationDescriptors) {
-    log.log(LogLevel::Error, "LISTEN_FDS passes %d sockets; the limit is %d: none is used", *count,
+  const int count = activatedDescriptors(getpid());
+  if (count == 0) return {};
+  if (count > limits::kActivationDescriptors) {
+    log.log(LogLevel::Error, "LISTEN_FDS passes %d sockets; the limit is %d: none is used", count,
             limits::kActivationDescriptors);
     return {};
   }
@@ -68,8 +56,8 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
   int chosen = -1;
   int fitting = 0;
   bool byName = false;
-  for (int i = 0; i < *count; ++i) {
-    const int descriptor = kFirstDescriptor + i;
+  for (int i = 0; i < count; ++i) {
+    const int descriptor = kFirstActivatedDescriptor + i;
     fcntl(descriptor, F_SETFD, FD_CLOEXEC);
     const auto index = static_cast<std::size_t>(i);
     const bool isNamed = index < names.size() && names[index] == name;
@@ -91,11 +79,11 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
     log.log(LogLevel::Error,
             "none of the %d sockets of LISTEN_FDS is known to be %s: set FileDescriptorName=%s "
             "in the socket unit",
-            *count, name, name);
+            count, name, name);
     return {};
   }
   // A copy of its own, so that releasing a listener does not free the number for other files.
-  Descriptor socket(fcntl(chosen, F_DUPFD_CLOEXEC, kFirstDescriptor));
+  Descriptor socket(fcntl(chosen, F_DUPFD_CLOEXEC, kFirstActivatedDescriptor));
   const int flags = socket ? fcntl(socket.get(), F_GETFL) : -1;
   if (flags < 0 || fcntl(socket.get(), F_SETFL, flags | O_NONBLOCK) != 0) {
     log.log(LogLevel::Error, "cannot use descriptor %d of LISTEN_FDS: %s", chosen,
