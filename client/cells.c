@@ -80,13 +80,7 @@ static struct Cell* findOrMake(struct Process* process, struct Segment* segment,
   }
 }
 
-struct Cell* bhFindCell(struct Key* key) {
-  struct Process* process = bhProcess();
-  if (!bhIsKey(process, key)) return NULL;
-  struct Segment* segment = bhSegment(process);
-  if (!segment) return NULL;
-  bhNoticeFold(process, segment);
-
+static struct Cell* currentCell(struct Process* process, struct Segment* segment, struct Key* key) {
   const uint64_t start = startOfNow();
   struct Cell* cell = atomic_load_explicit(&key->cell, memory_order_acquire);
   if (cell && atomic_load(&cell->start) == start) return cell;
@@ -97,5 +91,16 @@ struct Cell* bhFindCell(struct Key* key) {
   }
   struct Cell* left = atomic_exchange(&key->cell, cell);
   if (left && left != cell) closeCell(left);
+  return cell;
+}
+
+struct Cell* bhFindCell(struct Key* key) {
+  struct Process* process = bhProcess();
+  if (!bhIsKey(process, key)) return NULL;
+  struct Segment* segment = bhSegment(process);
+  if (!segment) return NULL;
+  bhNoticeFold(process, segment);
+  struct Cell* cell = currentCell(process, segment, key);
+  bhForgetInterrupted(process, segment);
   return cell;
 }

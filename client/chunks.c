@@ -111,24 +111,30 @@ static struct Lane* laneOfThread(struct State* state) {
   return bhLane;
 }
 
-void bhRecordSlowly(struct Key* key, double value) {
-  struct Process* process = bhProcess();
-  if (!bhIsKey(process, key)) return;
-  struct Segment* segment = bhSegment(process);
-  if (!segment) return;
-
+/* False when there is no room. */
+static bool recordInto(struct Process* process, struct Segment* segment, struct Key* key,
+                       double value) {
   uint64_t time = bhSeconds(CLOCK_REALTIME_COARSE);
   if (!bhIsCredible(time)) time = kBHUndated | bhSeconds(CLOCK_BOOTTIME);
   const uint32_t number = bhNameKey(process, segment, key);
   struct Lane* lane = laneOfThread(process->state);
   while (number != 0) {
     struct Chunk* chunk = atomic_load_explicit(&lane->chunk, memory_order_acquire);
-    if (chunk && bhPut(chunk, value, bhMark(number, time))) return;
+    if (chunk && bhPut(chunk, value, bhMark(number, time))) return true;
     struct Chunk* fresh = takeChunk(process, segment);
     if (!fresh) break;
     if (!atomic_compare_exchange_strong(&lane->chunk, &chunk, fresh)) {
       keepEmpty(process->state, fresh);
     }
   }
-  bhDrop(process, segment);
+  return false;
+}
+
+void bhRecordSlowly(struct Key* key, double value) {
+  struct Process* process = bhProcess();
+  if (!bhIsKey(process, key)) return;
+  struct Segment* segment = bhSegment(process);
+  if (!segment) return;
+  if (!recordInto(process, segment, key, value)) bhDrop(process, segment);
+  bhForgetInterrupted(process, segment);
 }

@@ -30,6 +30,11 @@ bool bhIsKey(const struct Process* process, const struct Key* key);
 
 /* The process's segment; begins one when there is none. NULL on failure, see `State.status`. */
 struct Segment* bhSegment(struct Process* process);
+/* In a child: lets go of the parent's segment, in which it must not write. */
+void bhForgetParent(void);
+/* Ends a call that may have changed `State`: what it noted of a segment that is not this process's,
+ * because a signal handler within the call made this child, is emptied again. */
+void bhForgetInterrupted(struct Process* process, const struct Segment* segment);
 /* Fetches memory, so that a full tmpfs shows here and not as SIGBUS. */
 bool bhFetch(const void* from, size_t bytes);
 void bhAskForFold(struct Process* process);

@@ -1,3 +1,4 @@
+#include <pthread.h>
 #include <stdlib.h>
 #include <string.h>
 #include <sys/mman.h>
@@ -27,6 +28,11 @@ static bool findFolder(char folder[kLongestFolder]) {
   if (length > 0) memcpy(folder, root, length);
   memcpy(folder + length, kFolder, sizeof kFolder);
   return true;
+}
+
+/* When this fails, a child lets go of its parent's segment with its first value. */
+__attribute__((constructor)) static void registerForForks(void) {
+  pthread_atfork(NULL, NULL, bhForgetParent);
 }
 
 struct Process* bhMakeProcess(void) {

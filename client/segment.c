@@ -1,24 +1,31 @@
+#include <signal.h>
+#include <string.h>
+
 #include "internal.h"
 
-/* A child that records lets go of its parent's segment, which can then be retired. Memory stays in
- * its place: the child may have been made by a signal handler within a record, and returns there.
- */
-static void forgetParent(struct Process* process, struct Segment* inherited) {
+/* A child lets go of its parent's segment, which can then be retired. Memory stays in its place:
+ * the child may have been made by a signal handler within a record, and returns there. */
+static void forgetInherited(struct Process* process, struct Segment* inherited) {
   if (inherited && atomic_compare_exchange_strong(&process->mapped, &inherited, NULL)) {
     bhForgetMapping(inherited);
   }
 }
 
-struct Segment* bhSegment(struct Process* process) {
-  struct State* state = process->state;
-  /* Read first: a segment of this process is published before it is noted as mapped. */
+void bhForgetParent(void) {
+  struct Process* process = bhProcess();
+  if (!process) return;
   struct Segment* mapped = atomic_load(&process->mapped);
-  struct Segment* known = atomic_load_explicit(&state->segment, memory_order_acquire);
-  if (known) return known;
-  forgetParent(process, mapped);
-  const uint64_t now = bhSeconds(CLOCK_MONOTONIC_COARSE);
-  if (now < atomic_load_explicit(&state->retryAt, memory_order_relaxed)) return NULL;
+  /* Another library's handler may have recorded in the child already. */
+  if (!atomic_load(&process->state->segment)) forgetInherited(process, mapped);
+}
 
+void bhForgetInterrupted(struct Process* process, const struct Segment* segment) {
+  struct State* state = process->state;
+  if (atomic_load(&state->segment) != segment) memset(state, 0, sizeof *state);
+}
+
+static struct Segment* begin(struct Process* process, uint64_t now) {
+  struct State* state = process->state;
   char name[64];
   BHClientStatus status = BHClientStatusFailed;
   struct Segment* begun = bhBeginSegment(process->folder, name, &status);
@@ -29,6 +36,7 @@ struct Segment* bhSegment(struct Process* process) {
   }
   /* No thread waits here for another, or for the code that a signal handler interrupted: each
    * begins a segment, and one of them stays. */
+  struct Segment* known = NULL;
   if (atomic_compare_exchange_strong_explicit(&state->segment, &known, begun, memory_order_acq_rel,
                                               memory_order_acquire)) {
     atomic_store(&process->mapped, begun);
@@ -36,6 +44,25 @@ struct Segment* bhSegment(struct Process* process) {
   }
   bhAbandonSegment(process->folder, name, begun);
   return known;
+}
+
+struct Segment* bhSegment(struct Process* process) {
+  struct State* state = process->state;
+  /* Read first: a segment of this process is published before it is noted as mapped. */
+  struct Segment* mapped = atomic_load(&process->mapped);
+  struct Segment* known = atomic_load_explicit(&state->segment, memory_order_acquire);
+  if (known) return known;
+  forgetInherited(process, mapped);
+  const uint64_t now = bhSeconds(CLOCK_MONOTONIC_COARSE);
+  if (now < atomic_load_explicit(&state->retryAt, memory_order_relaxed)) return NULL;
+
+  /* A child that a signal handler made here would return to share the segment. */
+  sigset_t all, before;
+  sigfillset(&all);
+  pthread_sigmask(SIG_SETMASK, &all, &before);
+  struct Segment* begun = begin(process, now);
+  pthread_sigmask(SIG_SETMASK, &before, NULL);
+  return begun;
 }
 
 void bhAskForFold(struct Process* process) {

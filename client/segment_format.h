@@ -51,10 +51,10 @@
  * shared mapping of it exists. The kernel tells exactly: on a descriptor opened for reading,
  * fcntl(F_SETLEASE, F_RDLCK) fails with EAGAIN while there is a writer, whatever its PID namespace
  * and whether or not the process closed its descriptors. (Set F_SETSIG to SIGURG first, and remove
- * the lease at once.) A process never opens a segment that exists. A child of fork inherits the
- * mapping, and gives it up with its first value, or with exec. Where leases do not work, the header
- * names the process: PID namespace, PID and start time as in /proc/PID/stat; it is gone when the
- * reader is in the same namespace and no such process exists.
+ * the lease at once.) A process never opens a segment that exists. A child of fork gives the
+ * mapping up at once; one made by another call does with its first value, or with exec. Where
+ * leases do not work, the header names the process: PID namespace, PID and start time as in
+ * /proc/PID/stat; it is gone when the reader is in the same namespace and no such process exists.
  */
 #ifndef BRIMHOLD_SEGMENT_FORMAT_H
 #define BRIMHOLD_SEGMENT_FORMAT_H

@@ -99,8 +99,9 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
     add(1);
     record(1);
     const Gate recorded, left;
-    if (fork() == 0) {
-      if (fork() == 0) {
+    // No handlers of the library run here, as with clone: the first value has to let go.
+    if (_Fork() == 0) {
+      if (_Fork() == 0) {
         // The middle process is a parent that ends first, as of a daemon.
         left.wait();
         add(10);
@@ -126,6 +127,56 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
   fold();
   EXPECT_EQ(scalar("count"), 11);
   EXPECT_EQ(records["series"], (std::vector<double>{1, 2}));
+}
+
+TEST_F(Recording, AChildWithoutValuesHoldsNoSegment) {
+  const Gate forked, seen;
+  run([&] {
+    add(1);
+    if (fork() == 0) {
+      forked.open();
+      seen.wait();
+    } else {
+      forked.wait();
+    }
+  });
+  EXPECT_EQ(writerOf(segments().at(0)), SegmentWriter::Gone);
+  seen.open();
+}
+
+TEST_F(Recording, AChildMadeWithinACallRecordsForItself) {
+  auto& done = shared<std::atomic<int>>();
+  // Calls, and how often each fetches memory. The first time is for the segment, when signals wait.
+  const std::pair<void (*)(), int> cases[] = {{[] { add(1); }, 4}, {[] { record(1); }, 7}};
+  for (const auto& [call, fetches] : cases) {
+    for (int at = 2; at <= fetches; ++at) {
+      SCOPED_TRACE(at);
+      done = 0;
+      run([&, &call = call] {
+        keys();
+        int left = at;
+        pid_t child = -1;
+        int own = 0;
+        // As a signal handler might. What it interrupts is recorded in the parent alone.
+        whileFetching = [&] {
+          if (--left == 0) child = fork();
+          if (left == 0 && child == 0) own = -1;
+        };
+        for (int i = 0; i < 2000; ++i, ++own)
+          call();
+        done += own;
+        BHClientScalarAdd(BHClientScalarForKey(child == 0 ? "child" : "parent"), 1);
+        EXPECT_TRUE(child == 0 || waitFor(child) == 0);
+      });
+      scalars.clear();
+      records.clear();
+      fold();
+      ASSERT_EQ(scalar("count") + std::ssize(records["series"]), done);
+      ASSERT_EQ(scalar("child"), 1);
+      ASSERT_EQ(scalar("parent"), 1);
+      ASSERT_TRUE(segments().empty());
+    }
+  }
 }
 
 TEST_F(Recording, EachValueBelongsToTheDayThatTheClockShows) {
