@@ -26,11 +26,11 @@ constexpr FigureKind kKinds[] = {
     {"power_on_hours", kPlain, Course::Lifetime, "attribute 9", "time under power"},
     {"power_cycles", kEvents, Course::Lifetime, "attribute 12", "power cycles"},
     {"bad_sectors", kEvents, Course::Gauge, "attributes 5 and 197",
-     "reallocated sectors and those that wait for it"},
+     "reallocated sectors, and those that wait for reallocation"},
     {"reallocated_sectors", kEvents, Course::Lifetime, "attribute 5", "reallocated sectors"},
     {"pending_sectors", kEvents, Course::Gauge, "attribute 197",
      "unstable sectors that wait for reallocation"},
-    {"crc_errors", kEvents, Course::Lifetime, "attribute 199", "errors of the cable"},
+    {"crc_errors", kEvents, Course::Lifetime, "attribute 199", "errors on the cable"},
     {"failing_attributes", kEvents, Course::Gauge, "all attributes",
      "pre-failure attributes at or below their thresholds"},
 };
