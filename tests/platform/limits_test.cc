@@ -269,17 +269,24 @@ TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {
     ASSERT_TRUE((*batch)->commit());
     sql("PRAGMA wal_checkpoint(TRUNCATE)");
     std::string content = contentOf(store.path());
+    const std::string sound = content;
     content.at(content.find("com.example.0000") + 12) ^= 8;  // the first key of the day
     std::ofstream(store.path()) << content;
     EXPECT_EQ(tidy().failures,
               Lines{where + "its rows are not in the order of their keys: restore the "
                             "file from a copy or move it away"});
-    const auto erased = store.erase({.prefix = "com.example."});
-    ASSERT_FALSE(erased);
-    EXPECT_EQ(erased.error().message, where +
-                                          "it was damaged and is set aside with what was to be "
-                                          "erased: remove that file");
-    EXPECT_EQ(store.erase({.prefix = "com.example."})->scalars, 0U);
+    // A key that no longer has the prefix keeps others with it from being found.
+    content = sound;
+    content.at(content.find("com.example.0003")) ^= 8;
+    for (const bool isTidied : {true, false}) {
+      if (!isTidied) std::ofstream(store.path()) << content;
+      const auto erased = store.erase({.prefix = "com.example."});
+      ASSERT_FALSE(erased);
+      EXPECT_EQ(erased.error().message, where +
+                                            "it was damaged and is set aside with what was to be "
+                                            "erased: remove that file");
+      EXPECT_EQ(store.erase({.prefix = "com.example."})->scalars, 0U);
+    }
   }
 }
 

@@ -61,12 +61,12 @@ void readLog(const std::string& path) {
   if (got < 0) throw unreadable("its write-ahead log", errno);
 }
 
+}  // namespace
+
 bool isSound(SqliteConnection& connection) {
   SqliteStatement check(connection, "PRAGMA integrity_check(1)");
   return check.step() && check.bytes(0) == "ok";
 }
-
-}  // namespace
 
 std::optional<StoreFailure> doubtDamage(const std::string& path,
                                         const std::shared_ptr<BusyBudget>& busy,

@@ -11,6 +11,9 @@
 
 namespace tavrel {
 
+/// Whether SQLite's check of the whole store finds it as it should be: the order of rows, too.
+bool isSound(SqliteConnection& connection);
+
 /// Looks again, on connections of its own; this process must have no other one that is open.
 /// Nothing when there is damage and every byte can be read, otherwise what to say of the store.
 /// Takes as long as reading all of it. `leavesNoTrace` as for `openStoreForReading`.

@@ -11,6 +11,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "platform/guarded.h"
+#include "platform/linux/store/second_look.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/store_path.h"
 
@@ -167,6 +168,10 @@ Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
     batch.begin();
     batch.finish();
     SqliteConnection connection = batch.release();
+    // A search among rows out of order misses some that are to be erased.
+    if (!isSound(connection)) {
+      throw StoreFailure{StoreFault::Damaged, "SQLite's check finds it damaged"};
+    }
     StoreErasure erasure(connection, site_.path);
     {
       const StoreFolderLock lock(site_.path, *site_.busy);
