@@ -1,11 +1,11 @@
 # Completions and manual pages that the built tools make of their own commands:
 #
 #   BUILD/completions/bash/PROGRAM, zsh/_PROGRAM, fish/PROGRAM.fish of tavrelctl and tavrel-fleet
-#   BUILD/man/tavrelctl.1
+#   BUILD/man/PROGRAM.1 of both
 #
 # A cross build needs CMAKE_CROSSCOMPILING_EMULATOR to run the tools, and has none of them without.
 if(CMAKE_CROSSCOMPILING AND NOT CMAKE_CROSSCOMPILING_EMULATOR)
-  message(WARNING "No completions and no tavrelctl(1): set CMAKE_CROSSCOMPILING_EMULATOR")
+  message(WARNING "No completions and pages of tools: set CMAKE_CROSSCOMPILING_EMULATOR")
   return()
 endif()
 
@@ -35,8 +35,9 @@ foreach(program IN LISTS completed_programs)
   tavrel_generated_document(completions/bash/${program} ${program} ARGUMENTS bash)
   tavrel_generated_document(completions/zsh/_${program} ${program} ARGUMENTS zsh)
   tavrel_generated_document(completions/fish/${program}.fish ${program} ARGUMENTS fish)
+  set(template ${PROJECT_SOURCE_DIR}/packaging/man/${program}.1.in)
+  tavrel_generated_document(man/${program}.1 ${program} ARGUMENTS man ${template}
+    DEPENDS ${template})
 endforeach()
-set(template ${PROJECT_SOURCE_DIR}/packaging/man/tavrelctl.1.in)
-tavrel_generated_document(man/tavrelctl.1 tavrelctl ARGUMENTS man ${template} DEPENDS ${template})
 
 add_custom_target(tavrel_documents ALL DEPENDS ${tavrel_generated_documents})

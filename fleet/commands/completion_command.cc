@@ -9,6 +9,7 @@
 #include "fleet/commands/question.h"
 #include "fleet/questions/grouping.h"
 #include "tools/completion/scripts/completion_script.h"
+#include "tools/completion/scripts/man_page.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -59,18 +60,26 @@ CompletedProgram completedProgram(const Command& program) {
 }  // namespace
 
 void addCompletionCommand(Command top, FleetContext& context) {
-  const auto what = std::make_shared<std::string>();
-  const Command command = top.addCommand("completion", "Print what shells complete");
+  struct Arguments {
+    std::string what;
+    std::string file;
+  };
+  const auto arguments = std::make_shared<Arguments>();
+  const Command command =
+      top.addCommand("completion", "Print what shells complete, or the manual page");
   command.hide();
-  command.addOption("WHAT", *what, "A shell, or a list")
+  command.addOption("WHAT", arguments->what, "A shell, a list, or man")
       .required()
-      .oneOf({"bash", "zsh", "fish", "versions"});
-  command.onRun([&context, what, top] {
-    if (*what == "versions") return listVersions(context);
+      .oneOf({"bash", "zsh", "fish", "man", "versions"});
+  command.addOption("FILE", arguments->file, "Template of the manual page");
+  command.onRun([&context, arguments, top] {
+    const std::string& what = arguments->what;
+    if (what == "versions") return listVersions(context);
+    if (what == "man") return printManPage(context, arguments->file, modelOf(top));
     const CompletedProgram program = completedProgram(top);
-    context.out() << (*what == "bash"  ? bashScript(program)
-                      : *what == "zsh" ? zshScript(program)
-                                       : fishScript(program));
+    context.out() << (what == "bash"  ? bashScript(program)
+                      : what == "zsh" ? zshScript(program)
+                                      : fishScript(program));
   });
 }
 

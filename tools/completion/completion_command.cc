@@ -8,13 +8,11 @@
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
-#include "base/limits.h"
-#include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
-#include "tools/completion/man_page.h"
 #include "tools/completion/scripts/completion_script.h"
+#include "tools/completion/scripts/man_page.h"
 #include "tools/stat/recorded.h"
 
 namespace tavrel {
@@ -81,15 +79,6 @@ void listLogs(ToolContext& context) {
   }
 }
 
-void printManPage(ToolContext& context, const std::string& file, const Command& program) {
-  FileSystem files;
-  const auto pageTemplate = files.read(file, limits::kPropertyListBytes);
-  if (!pageTemplate) return context.fail(pageTemplate.error().message);
-  const auto page = manPage(*pageTemplate, modelOf(program));
-  if (!page) return context.fail(file + ": " + page.error().message);
-  context.out() << *page;
-}
-
 CompletedProgram completedProgram(const Command& program) {
   return {.model = modelOf(program),
           .anywhere = "--root",
@@ -119,7 +108,7 @@ void addCompletionCommand(Command program, ToolContext& context) {
     if (what == "days") return listDays(context);
     if (what == "domains") return listDomains(context);
     if (what == "logs") return listLogs(context);
-    if (what == "man") return printManPage(context, arguments->file, program);
+    if (what == "man") return printManPage(context, arguments->file, modelOf(program));
     const CompletedProgram completed = completedProgram(program);
     context.out() << (what == "bash"  ? bashScript(completed)
                       : what == "zsh" ? zshScript(completed)

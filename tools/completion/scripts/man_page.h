@@ -6,6 +6,7 @@
 
 #include "base/expected.h"
 #include "tools/shared/command_model.h"
+#include "tools/shared/tool_output.h"
 
 namespace tavrel {
 
@@ -18,5 +19,8 @@ namespace tavrel {
 ///
 /// Fails on a command that the program does not have.
 Expected<std::string> manPage(std::string_view pageTemplate, const CommandModel& program);
+
+/// Prints what becomes of the template in the file.
+void printManPage(ToolOutput& output, const std::string& file, const CommandModel& program);
 
 }  // namespace tavrel

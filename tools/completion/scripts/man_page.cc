@@ -1,7 +1,11 @@
-#include "tools/completion/man_page.h"
+#include "tools/completion/scripts/man_page.h"
 
 #include <algorithm>
+#include <ostream>
 #include <set>
+
+#include "base/limits.h"
+#include "platform/linux/files/file_system.h"
 
 namespace tavrel {
 namespace {
@@ -69,9 +73,9 @@ std::string entryOf(const OptionModel& option) {
   return ".TP\n" + names + "\n" + roff(option.description) + ".\n";
 }
 
-class Page {
+class ManPage {
  public:
-  explicit Page(const CommandModel& program) {
+  explicit ManPage(const CommandModel& program) {
     walk(program, [this](const CommandModel& command) {
       if (command.commands.empty()) commands_.emplace_back(&command);
     });
@@ -153,13 +157,22 @@ class Page {
 }  // namespace
 
 Expected<std::string> manPage(std::string_view pageTemplate, const CommandModel& program) {
-  Page page(program);
+  ManPage page(program);
   while (!pageTemplate.empty()) {
     const std::size_t end = std::min(pageTemplate.find('\n'), pageTemplate.size());
     if (const Status taken = page.take(pageTemplate.substr(0, end)); !taken) return taken.error();
     pageTemplate.remove_prefix(std::min(end + 1, pageTemplate.size()));
   }
   return page.end();
+}
+
+void printManPage(ToolOutput& output, const std::string& file, const CommandModel& program) {
+  FileSystem files;
+  const auto pageTemplate = files.read(file, limits::kPropertyListBytes);
+  if (!pageTemplate) return output.fail(pageTemplate.error().message);
+  const auto page = manPage(*pageTemplate, program);
+  if (!page) return output.fail(file + ": " + page.error().message);
+  output.out() << *page;
 }
 
 }  // namespace tavrel
