@@ -2,7 +2,7 @@
  *
  *   workers MILLISECONDS
  *
- * Each of four workers computes for so long, job after job. The second one is killed halfway. */
+ * Each of four workers computes for that time, job after job. The second one is killed halfway. */
 #define _DEFAULT_SOURCE
 #include <brimhold/client.h>
 #include <signal.h>
