@@ -1,4 +1,4 @@
-// Writing to descriptors of the process.
+// Writes to the process's file descriptors.
 #pragma once
 
 #include <cstddef>
@@ -11,7 +11,7 @@ class DescriptorWriter {
  public:
   virtual ~DescriptorWriter() = default;
 
-  /// One system call. Yields how many bytes it took, negative when it failed.
+  /// Makes one system call. Returns the number of bytes written, negative on failure.
   virtual std::ptrdiff_t write(int descriptor, ByteSpan bytes) = 0;
 };
 

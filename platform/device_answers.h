@@ -1,4 +1,4 @@
-// The device-answers query: facts about the device by the name of the question.
+// The device-answers query: facts about the device, looked up by the name of the question.
 #pragma once
 
 #include <string_view>

@@ -1,6 +1,6 @@
 // The packed form in which the values of a distribution are stored and passed on.
 //
-// Values and their offsets are kept apart, so that whoever wants the values alone reads no more.
+// Values and their offsets are kept apart, so that a reader of the values alone reads nothing else.
 // A value has 8 bytes: the double's 64 bits, little-endian. An offset has 4 bytes: seconds within
 // the day, little-endian. They are adjacent, in the order of recording, at any alignment.
 #pragma once

@@ -15,8 +15,8 @@ class EventLoop {
 
   virtual ~EventLoop() = default;
 
-  /// Waits until an event has been handled or the time is over, for its full length even when there
-  /// are no event sources.
+  /// Waits until an event has been handled or the time is up. Without event sources, waits the full
+  /// time.
   virtual Slice runSlice(std::chrono::milliseconds longest) = 0;
 };
 

@@ -7,7 +7,7 @@
 
 namespace tavrel {
 
-/// Runs `action` and logs what it throws, most likely because memory is short, as "cannot WHAT:
+/// Runs `action`. Logs an exception, which most likely means that memory ran out, as "cannot WHAT:
 /// reason".
 template <class Action>
 void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
@@ -18,7 +18,7 @@ void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
       log.log(LogLevel::Error, "cannot %s: %s", what, failure.what());
     }
   } catch (...) {
-    // Not even the line found memory.
+    // There was no memory even for the log line.
   }
 }
 

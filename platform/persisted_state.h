@@ -1,5 +1,5 @@
-// Names of the preferences that last, for all code that reads or writes them: the daemon's state,
-// and what others decide for it.
+// Names of the persistent preferences, for all code that reads or writes them: the daemon's state,
+// and the settings that others make for it.
 #pragma once
 
 #include <string_view>
@@ -9,10 +9,10 @@ namespace tavrel {
 /// The domain of the daemon's own state. Its service has the same name.
 inline constexpr std::string_view kTavrelDomain = "com.norvane.tallied.tavrel";
 
-/// Integer: the last day that the gated run has done.
+/// Integer: the last day whose tasks the gated run has done.
 inline constexpr std::string_view kLastRunDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
-/// String: what became of that run's log, a name from report/log_outcome.h.
+/// String: the outcome of that run's log, a name from report/log_outcome.h.
 inline constexpr std::string_view kLastLogOutcomeKey = "LastLogOutcome";
 
 /// String: the OS version at the last log.

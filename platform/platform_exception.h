@@ -1,4 +1,4 @@
-// The exception that services of the platform raise.
+// The exception that platform services throw.
 //
 // Services report failures in their results. This exception is for failures that have no place in a
 // result; code that guards its work against services catches this type and no other.

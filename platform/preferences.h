@@ -16,13 +16,13 @@ class Preferences {
  public:
   virtual ~Preferences() = default;
 
-  /// Bytes of a value as XML, with its key: nobody may fill a shared domain with a single value.
+  /// Largest size in bytes of a key and its value as XML: no single value may fill a shared domain.
   static constexpr std::size_t kLargestChange = 1U << 20;
 
   /// Null when the key is absent or its domain cannot be read.
   virtual plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) = 0;
 
-  /// Stores `value`; a null value removes the key. A value that has no form as XML or needs more
+  /// Stores `value`; a null value removes the key. A value that XML cannot hold or that needs more
   /// than `kLargestChange` is dropped, with a line in the system log when the domain is
   /// synchronised.
   virtual void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
@@ -33,7 +33,7 @@ class Preferences {
   virtual bool ZTXPreferencesSynchronize(std::string_view domain) = 0;
 
   /// The value as an integer, 0 when it is absent or not a number. `keyExistsAndHasValidFormat`
-  /// tells the cases apart.
+  /// distinguishes a stored 0 from these cases.
   std::int64_t ZTXPreferencesGetIntegerValue(std::string_view key, std::string_view domain,
                                              bool* keyExistsAndHasValidFormat = nullptr);
 

@@ -50,8 +50,8 @@ class BHHistoryDistributionEnumerator {
   bool failed() const { return failed_; }
 
  protected:
-  /// The next values, with their offsets when those are wanted; valid until the next call. No
-  /// values: none is left.
+  /// The next values, with their offsets when wanted; valid until the next call. Empty when none is
+  /// left.
   virtual DistributionBlock nextBlock(bool wantsOffsets) = 0;
   /// Call this before `nextBlock` yields nothing because of a failure.
   void fail() { failed_ = true; }
@@ -64,7 +64,7 @@ class BHHistoryDistributionEnumerator {
 /// A reader of the store. Queries select the rows whose key begins with the prefix and whose day is
 /// greater than `minDaysSince1970` and at most `maxDaysSince1970`. Rows arrive ordered by key
 /// (bytewise), then by day, before the query returns; the handler may set `stop` to end it early.
-/// Bounds are wider than days, so that they can express the day before the first one.
+/// Bounds have more bits than days, so that they can express the day before the first one.
 class BHHistory {
  public:
   using ScalarRowHandler =
@@ -101,8 +101,8 @@ class StatisticsStore {
   /// the end of the run.
   virtual void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
 
-  /// The history at its default location. A store that cannot be read is reported to the system log
-  /// and gives a history without rows.
+  /// The history at its default location. A store that cannot be read is reported to the system
+  /// log, and the history then has no rows.
   virtual std::unique_ptr<BHHistory> initWithDefaultPath() = 0;
 };
 

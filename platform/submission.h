@@ -1,4 +1,4 @@
-// The diagnostic-log submission service: whether logs may leave the device, and how they do.
+// The diagnostic-log submission service: whether and how logs leave the device.
 #pragma once
 
 #include <functional>

@@ -5,8 +5,8 @@
 //
 // Variants of a platform copy the bundle and replace the services that differ.
 //
-// It owns the services. It opens and reads nothing before the first use. Destruction commits the
-// values that the store holds back, then writes changed preferences.
+// It owns the services, and opens and reads nothing before their first use. Its destructor commits
+// the values that wait in the store, then writes changed preferences.
 #pragma once
 
 #include <memory>
@@ -24,11 +24,11 @@ class RecordedRegistry;
 class SegmentFold;
 class SqliteStore;
 
-/// How one Linux platform may differ from another. Everything given here must outlive it.
+/// Differences from the usual platform. Everything given here must outlive the platform.
 struct LinuxPlatformOptions {
-  SystemLog* log = nullptr;            // in place of the journal or standard error
-  FileSystem* fileSystem = nullptr;    // what writes files, in place of its own
-  Preferences* preferences = nullptr;  // what the other services read, in place of its own
+  SystemLog* log = nullptr;            // instead of the journal or standard error
+  FileSystem* fileSystem = nullptr;    // writes files, instead of its own
+  Preferences* preferences = nullptr;  // for the other services, instead of its own
   /// A damaged store stays where it is, ECC events stay in their queue, nothing is folded.
   bool readOnly = false;
 };
@@ -43,7 +43,7 @@ class LinuxPlatform {
   Platform& platform();
   const DeviceRoot& root() const;
 
-  /// The concrete services, for operations that only the tool has.
+  /// The concrete services, for operations that only the tool needs.
   FileCrashReporting& crashReporting();
   FileSystem& fileSystem();
   FilePreferences& preferences();

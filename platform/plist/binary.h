@@ -1,7 +1,7 @@
 // The binary encoding of property lists, which begins with "bplist00".
 //
 // A document is a header, objects, a table of their offsets and a trailer of 32 bytes. Objects
-// refer to each other by number, so that a text or number used in many places is written once. All
+// refer to each other by number, so a string or number used in many places is written once. All
 // words are big-endian.
 //
 //   const auto document = plist::readBinary(bytes);
@@ -9,7 +9,7 @@
 //
 // What is written reads back equal, except for malformed UTF-8: each such byte becomes U+FFFD (keys
 // that become equal are distinguished as in platform/plist/xml.h). Floats and doubles keep their
-// kind, integers are read as 64-bit ones.
+// kind; integers are read as 64-bit integers.
 #pragma once
 
 #include <string>
@@ -24,8 +24,8 @@ namespace tavrel::plist {
 /// document that the limits of base/limits.h would refuse to read.
 Expected<std::string> writeBinary(const Value& value);
 
-/// The value is the caller's own: a container or data that the document refers to from several
-/// places becomes several values. Of two equal keys in one dictionary the later wins.
+/// The value is the caller's own: a container or data object that the document refers to from
+/// several places becomes several values. Of two equal keys in one dictionary the later wins.
 Expected<Value> readBinary(ByteSpan bytes);
 
 }  // namespace tavrel::plist

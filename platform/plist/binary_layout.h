@@ -5,10 +5,11 @@
 //   table    the offset of each object, in words of `offsetWidth` bytes
 //   trailer  32 bytes
 //
-// The low four bits of a marker are a length: for numbers the binary logarithm of their bytes; for
-// texts, data and containers the number of their elements, or 15 when an integer object with that
-// number follows. A container holds references, which are object numbers of `referenceWidth` bytes:
-// an array those of its elements, a dictionary those of its keys and then those of its values.
+// The low four bits of a marker are a length: for numbers the binary logarithm of their size in
+// bytes; for texts, data and containers the number of their elements, or 15 when an integer object
+// with that number follows. A container holds references, which are object numbers of
+// `referenceWidth` bytes: an array those of its elements, a dictionary those of its keys and then
+// those of its values.
 #pragma once
 
 #include <cstddef>

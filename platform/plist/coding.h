@@ -1,4 +1,4 @@
-// Property-list coding as a service of the platform, and reading of either encoding.
+// Property-list coding as a platform service, and a reader of both encodings.
 #pragma once
 
 #include <string>
@@ -13,7 +13,7 @@ namespace tavrel::plist {
 /// Reads an XML or a binary document, recognised by content.
 Expected<Value> read(ByteSpan bytes);
 
-/// Stateless: one object can serve all.
+/// Stateless: one object can serve all users.
 class PlistCoding final : public PropertyListCoding {
  public:
   Expected<std::string> encodeXml(const Value& value) override;

@@ -12,7 +12,7 @@ enum class Alphabet : std::uint8_t {
   Xml       // without the control characters and U+FFFE, U+FFFF that XML 1.0 forbids
 };
 
-/// True when the alphabet has all characters of the text.
+/// True when the text is well-formed and the alphabet has all its characters.
 bool isEncodable(std::string_view text, Alphabet alphabet);
 
 /// The text with U+FFFD for each malformed byte and each character that the alphabet lacks.

@@ -1,4 +1,4 @@
-// Shared by the two encoders: refused values, and the order of keys.
+// Shared by the two encoders: checks that refuse values, and the order of keys.
 #pragma once
 
 #include <cstddef>
@@ -14,7 +14,7 @@
 namespace tavrel::plist {
 
 /// Admits the values of one document, and remembers the reason for a refusal. Operations return
-/// false for a failure, so that a walk can pass their result on.
+/// false on failure, so that a walk can pass the result on.
 class EncodingGuard {
  public:
   explicit EncodingGuard(std::size_t largestCount) : largestCount_(largestCount) {}
@@ -23,7 +23,7 @@ class EncodingGuard {
   bool admit(const Value& value, std::size_t depth);
   bool admitBytes(std::size_t documentBytes);
 
-  /// Fails because of the value at hand.
+  /// Refuses the current value; always returns false.
   bool fail(std::string reason);
 
   /// Notes, on the way back from a failure, through which key or index the value was reached.
@@ -40,9 +40,8 @@ class EncodingGuard {
   bool hasPath_ = false;
 };
 
-/// The entries of dictionaries in the order of their keys, with the keys in the alphabet. It is a
-/// stack, because dictionaries nest: entries stay until they are popped. Entries borrow from the
-/// dictionary.
+/// The entries of dictionaries, sorted by key, with keys limited to the alphabet. A stack, because
+/// dictionaries nest: entries stay until they are popped. Entries borrow from the dictionary.
 class SortedEntries {
  public:
   struct Item {
@@ -64,7 +63,7 @@ class SortedEntries {
 
   Alphabet alphabet_;
   std::vector<Item> items_;
-  std::deque<std::string> repaired_;  // keys that no dictionary holds
+  std::deque<std::string> repaired_;  // keys that differ from the dictionary's
 };
 
 }  // namespace tavrel::plist

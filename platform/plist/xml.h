@@ -1,9 +1,9 @@
 // The XML encoding of property lists.
 //
 // The writer produces UTF-8 without a document-type line, with tabs, and with keys in the order of
-// their bytes, so that equal values give equal bytes (numbers are equal here when they are of the
-// same sort and value). The reader takes any encoding that Expat knows, with or without a
-// document-type line; it declares and expands no entity and fetches nothing.
+// their bytes, so that equal values give equal bytes (numbers are equal here when kind and value
+// are the same). The reader takes any encoding that Expat knows, with or without a document-type
+// line; it declares and expands no entity and fetches nothing.
 //
 //   const auto document = plist::readXml(bytes);
 //   if (!document) log(document.error().message);  // "XML property list, line 3, column 7: ..."
@@ -25,11 +25,12 @@
 namespace tavrel::plist {
 
 /// Fails for a value that is or contains null, a date beyond the calendar (not a number, or more
-/// than 10^9 years off), and for a document that nests too deeply or is too long to be read back.
-/// More values than `readXml` takes do not make it fail: a large log is better written than lost.
+/// than 10^9 years off), and for a document that nests too deeply or is too long to be read back. A
+/// value with more nodes than `readXml` accepts is still written: better a large log than a lost
+/// one.
 Expected<std::string> writeXml(const Value& value);
 
-/// The value is the caller's own. Short memory is not an error of the document, so it throws
+/// The value is the caller's own. Running out of memory is not an error of the document: it throws
 /// std::bad_alloc. Of two equal keys in one dictionary the later wins.
 Expected<Value> readXml(ByteSpan bytes);
 

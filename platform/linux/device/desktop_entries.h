@@ -1,9 +1,9 @@
 // The applications that appear in menus, from their desktop entries.
 //
-// Entries are files *.desktop below the "applications" folder of each data folder. One counts when
-// it has "Type=Application" and neither "NoDisplay=true" nor "Hidden=true". The file's path below
-// that folder, with "-" for "/", names the application. The first data folder with an entry of a
-// name decides, in this order:
+// Entries are files *.desktop below the "applications" folder of each data folder. An entry counts
+// when it has "Type=Application" and neither "NoDisplay=true" nor "Hidden=true". The file's path
+// below that folder, with "-" for "/", names the application. Of entries with the same name, the
+// one in the first of these data folders counts:
 //
 //   /home/*/.local/share, /root/.local/share    the users' own
 //   /var/lib/flatpak/exports/share, /usr/local/share

@@ -2,20 +2,20 @@
 // under the device root.
 //
 // "NAME.event" holds one event of 72 bytes: the event's identifier and its count of registers (a
-// byte each), 6 bytes that are not read, and 8 registers of 64 bits in little-endian order.
-// "NAME.errno" holds the decimal number of an error with which one read fails. They are taken in
-// the order of their names. Files of other names are left alone.
+// byte each), 6 ignored bytes, and 8 registers of 64 bits in little-endian order. "NAME.errno"
+// holds the decimal number of an error with which one read fails. Files are taken in the order of
+// their names. Files with other names are left alone.
 //
-// An event is removed once `filed` says that its record is safe, an error with its read. A run of
-// reads ends with the first that fails. It gives ten events at most, and none after one that was
-// not filed: the next read fails with EBUSY and removes nothing. The folder is locked from
+// An event is removed once `filed` says that its record is safe, an error as soon as it is read. A
+// run of reads ends with the first that fails. It gives ten events at most, and none after an event
+// that was not filed: the next read fails with EBUSY and removes nothing. The folder is locked from
 // a run's first event to its end, so that no other process hands out the same ones.
 //
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
-// identifier 1 for corrected and 2 for uncorrected errors, with the number of the memory
-// controller, the new errors and all errors since the machine started as registers.
+// identifier 1 for corrected and 2 for uncorrected errors, with three registers: the number of the
+// memory controller, its new errors, and all its errors since boot.
 // /var/lib/tavrel/edac-counters.plist remembers the counts and the boot in which they were seen,
-// because in another boot the kernel counts from 0.
+// because the kernel counts from 0 again in each boot.
 #pragma once
 
 #include <cstddef>
@@ -36,7 +36,7 @@ namespace tavrel {
 
 inline constexpr std::size_t kEccEventBytes = 72;
 
-/// The most events in one run of reads.
+/// The most events that one run of reads hands out.
 inline constexpr int kEccEventsOfARun = 10;
 
 class EccEvents {
@@ -49,7 +49,7 @@ class EccEvents {
       : root_(root), files_(files), propertyLists_(propertyLists), log_(log), mode_(mode) {}
 
   /// Hands the next event out. ENOENT when there is none, EBUSY when it has to wait for another
-  /// run, ENOMEM when it does not fit; `buffer` is then left alone.
+  /// run, ENOMEM when it does not fit. `buffer` keeps its content on failure.
   SystemControls::Result next(MutableByteSpan buffer);
 
   /// Removes the event that was handed out last: its record is on storage.
@@ -63,7 +63,7 @@ class EccEvents {
 
   SystemControls::Result endRun(int errorNumber);
   void fill();
-  /// Moves an unusable file out of the way, or says that it would.
+  /// Renames an unusable file out of the way; when peeking, only logs that it would.
   void setAside(const std::string& path, std::string_view fault);
   /// The counts at the last look; for a controller that is gone, the last known ones.
   plist::Dictionary seenErrors();
@@ -71,8 +71,8 @@ class EccEvents {
   void publishCountedErrors();
   /// The events for errors beyond `counted`, which is updated.
   std::vector<Event> newErrors(plist::Dictionary& counted);
-  /// The id of the boot in which the controllers of that folder count. A root that has controllers
-  /// of its own shares neither the machine's errors nor its boots. Empty when unknown.
+  /// The ID of the boot in which the controllers in that folder have counted. A root that has
+  /// controllers of its own shares neither the machine's errors nor its boots. Empty when unknown.
   std::string bootIDBeside(const std::string& controllers);
 
   const DeviceRoot& root_;
@@ -80,7 +80,7 @@ class EccEvents {
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
   Mode mode_;
-  std::vector<Event> queue_;  // the next one last; empty: look again
+  std::vector<Event> queue_;  // the next one is last; read again when empty
   bool hasLooked_ = false;
   int handedOut_ = 0;      // in this run
   std::string unfiled_;    // the file of the event handed out last; empty once that is filed

@@ -7,9 +7,9 @@
 //     ZTXPreferencesGetIntegerValue   IntegerPreferenceGetter
 //     ZTXPreferencesSetValue          PreferenceSetter
 //
-// /etc/tavrel/dynamic-libraries.plist under the device root can take libraries away, to show the
-// behaviour without them: under the path of a library, false when it does not load, or an array of
-// the functions that it lacks. The file is read at each load.
+// /etc/tavrel/dynamic-libraries.plist under the device root can take libraries away, to show how
+// the system behaves without them. Its keys are library paths; a value is false for a library that
+// does not load, or an array of the functions that it lacks. The file is read at each load.
 #pragma once
 
 #include "platform/dynamic_loading.h"

@@ -16,8 +16,8 @@ namespace tavrel {
 /// Calls `handler` for each installed package, once for each architecture, identified as
 /// "name:architecture". A package counts as installed by the user when apt did not install it as a
 /// dependency and it is not part of the base system (priority required or important, Essential or
-/// Protected). Yields the number of packages; for 0 the caller counts desktop entries. Logs a file
-/// that exists but cannot be read, with what counts then.
+/// Protected). Returns the number of packages; for 0 the caller falls back to desktop entries. Logs
+/// a file that exists but cannot be read, and what that changes.
 std::size_t enumeratePackages(const DeviceRoot& root, SystemLog& log,
                               const std::function<void(const PWBundleProxy&)>& handler);
 

@@ -21,7 +21,7 @@ class DeviceRoot {
   /// The folder that TAVREL_ROOT names, otherwise "/".
   static DeviceRoot fromEnvironment();
 
-  /// An error when the folder does not exist. Services would create it.
+  /// An error when the folder does not exist: services would otherwise create it.
   Status check() const;
 
   /// The path on this machine of a path on the device.

@@ -7,14 +7,15 @@
 //   const Status done = files.replace(path, bytes, 0644);
 //   if (!done) log.write(LogLevel::Error, done.error().message);
 //
-// or piece by piece; a file that is not committed vanishes with its handle:
+// It can also be written piece by piece; a file that is not committed vanishes with its handle:
 //
 //   Expected<NewFile> file = files.create(path, 0640);
 //   file->write(bytes);
 //   file->commit();
 //
-// All errors name the path; those of a system call have its words. The system calls are virtual:
-// tests derive a file system that loses unflushed data and one whose n-th call fails.
+// All errors name the path; those of a system call include the system's error text. The system
+// calls are virtual: tests derive a file system that loses unflushed data and one whose n-th call
+// fails.
 #pragma once
 
 #include <cstddef>
@@ -37,7 +38,7 @@ namespace tavrel {
 
 class FileSystem;
 
-/// A file that does not have its name yet. Without `commit` it vanishes.
+/// A new file under a temporary name. Without `commit` it is removed with the handle.
 class NewFile {
  public:
   NewFile(NewFile&& other) noexcept;
@@ -46,7 +47,7 @@ class NewFile {
 
   /// Appends all of `bytes`.
   Status write(ByteSpan bytes);
-  /// Flushes the content to storage; the file still lacks its name.
+  /// Flushes the content to storage; the file keeps its temporary name.
   Status flush();
   /// Flushes, gives the file its name in place of an earlier file, and makes that durable. When
   /// only the last step fails, the file is in place but may not survive a power cut.
@@ -58,25 +59,26 @@ class NewFile {
 
   FileSystem& fileSystem_;
   std::string path_;
-  std::string temporary_;  // empty once there is nothing to remove
+  std::string temporary_;  // empty once no temporary file is left to remove
   Descriptor descriptor_;
   bool flushed_ = false;
 };
 
-/// How long to wait for a process that holds a lock, and what to advise when it was too long.
+/// How long to wait for a process that holds a lock, and the advice in the error when that was in
+/// vain.
 struct LockPatience {
   int milliseconds = limits::kFileLockMilliseconds;
   std::string_view advice = "end that process";
 };
 
-/// A file that grows by whole lines. It is locked until the handle is released, so that whoever
-/// appends in the same way waits; reading goes on.
+/// A file that grows by whole lines. It is locked until the handle is released: others that append
+/// through this class wait, readers do not.
 class AppendedFile {
  public:
   /// Appends lines in one write, which survives the end of the process but not a power cut. Lines
   /// that do not fit leave nothing behind. The file never grows beyond `largest` bytes.
   Status append(ByteSpan lines, std::size_t largest);
-  /// Writes what was appended, and the file's name, through to storage.
+  /// Makes the appended lines, and the file's name, durable.
   Status flush();
 
  private:
@@ -84,7 +86,7 @@ class AppendedFile {
   AppendedFile(FileSystem& fileSystem, std::string path, Descriptor descriptor)
       : fileSystem_(&fileSystem), path_(std::move(path)), descriptor_(std::move(descriptor)) {}
   Status cutTornEnd(std::int64_t size);
-  /// Cuts off what follows the whole lines.
+  /// Cuts off everything after the last whole line.
   Status mend();
 
   FileSystem* fileSystem_;
@@ -106,7 +108,7 @@ class FileSystem {
   /// The whole content of a regular file. Anything else is refused unread; more than `largest`
   /// bytes are an error.
   Expected<std::string> read(const std::string& path, std::size_t largest);
-  /// The same, nothing when there is no such file.
+  /// The same; nothing when there is no such file.
   Expected<std::optional<std::string>> readIfPresent(const std::string& path, std::size_t largest);
 
   /// Starts a new version of `path`. Missing folders are made. Temporary files that a killed
@@ -116,31 +118,30 @@ class FileSystem {
   /// An existing file keeps its owner and its mode, except for permissions that `mode` withholds.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
-  /// Opens a file, no link, to append to it; makes it and its folder when missing. Cuts off what a
-  /// kill or a power cut left after the last whole line: a line without an end, lines of zero
-  /// bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
+  /// Opens a file, but no symbolic link, to append to it; creates it and its folder when missing.
+  /// Cuts off what a kill or a power cut left after the last whole line: a line without an end,
+  /// lines of zero bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
   Status rename(const std::string& from, const std::string& to);
   /// Removes a file; a missing one is fine. Durable with the folder's next flush.
   Status remove(const std::string& path);
-  /// The same, but a failure does not matter: the next clean-up tries again.
+  /// The same, ignoring failures: the next clean-up tries again.
   void discard(const std::string& path) { removeFile(path.c_str()); }
   /// Makes a folder and those above it.
   Status makeFolders(const std::string& path);
-  /// The same; only its owner may use the folder itself, also when it exists already.
+  /// The same; the folder itself becomes accessible to its owner only, even when it already exists.
   Status makePrivateFolder(const std::string& path);
-  /// Makes durable what was added to a folder, removed from it and renamed in it; nothing for a
-  /// missing one.
+  /// Makes additions, removals and renames in a folder durable; does nothing for a missing one.
   Status flushFolder(const std::string& folder);
-  /// Removes the temporary files of a folder, also those that a process is writing: it can then no
+  /// Removes all temporary files of a folder, even those still being written: their writers can no
   /// longer commit them.
   void discardTemporaries(const std::string& folder);
 
   /// Locks the file `path`, made when missing, until the handle is released. Only its owner and
-  /// root can open it, and so nobody else can lock it; of a folder that all may write, only a
-  /// trusted user's is taken.
+  /// root can open it, so nobody else can lock it; in a folder that everybody may write to, the
+  /// file must belong to a trusted user.
   Expected<Descriptor> lockFile(const std::string& path, const LockPatience& patience = {});
   /// The same with the file `.lock` of a folder, which must exist.
   Expected<Descriptor> lockFolder(const std::string& folder);
@@ -154,7 +155,7 @@ class FileSystem {
   static std::optional<struct stat> status(const std::string& path);
 
  protected:
-  /// The system's calls: -1 with `errno` on failure. `openFile` sets close-on-exec.
+  /// System calls: -1 with `errno` on failure. `openFile` sets close-on-exec.
   virtual int openFile(const char* path, int flags, mode_t mode);
   virtual ssize_t writeFile(int descriptor, const std::byte* bytes, std::size_t size);
   virtual int syncFile(int descriptor);

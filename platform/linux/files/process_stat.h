@@ -7,8 +7,8 @@
 
 namespace tavrel {
 
-/// When the process began, in ticks since boot: field 22. The second field is the program's name in
-/// parentheses, which may hold anything. Nothing for other text.
+/// When the process started, in clock ticks since boot: field 22. The second field, the program's
+/// name in parentheses, may contain anything. Nothing for text of another form.
 std::optional<std::uint64_t> startInStat(std::string_view stat);
 
 }  // namespace tavrel

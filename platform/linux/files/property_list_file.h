@@ -10,13 +10,13 @@
 
 namespace tavrel {
 
-/// The dictionary in a file. An empty handle when the file is missing and, with a line in the
-/// system log, when it cannot be read or is not a dictionary.
+/// The dictionary in a file. An empty handle when the file is missing or, with a line in the system
+/// log, when it cannot be read or is not a dictionary.
 plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& propertyLists,
                                      SystemLog& log, const std::string& path);
 
-/// Why settings that decide about others' data are not to be trusted: users other than root and
-/// this process's may write the file, or its owner is unknown. Empty when they can be trusted.
+/// Why a file of settings that decide about other users' data cannot be trusted: users other than
+/// root and this process's may write it, or its owner is unknown. Empty when it can be trusted.
 std::string reasonToDistrust(const std::string& path);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// Instants in names of files and in lines for people, in UTC.
+// Instants as text for file names and for people, in UTC.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +11,7 @@ namespace tavrel {
 /// Seconds since 1970-01-01 00:00:00 UTC, rounded down, saturated.
 std::int64_t wholeSeconds(plist::Date instant);
 
-/// "20261116T180218Z", for names.
+/// "20261116T180218Z", for file names.
 std::string compactStamp(plist::Date instant);
 
 /// "2026-11-16T18:02:18.123Z", milliseconds cut off.

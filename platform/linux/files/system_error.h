@@ -1,4 +1,4 @@
-// Failures of the system as readable errors.
+// Failed system calls as readable errors.
 #pragma once
 
 #include <cerrno>
@@ -9,7 +9,7 @@
 
 namespace tavrel {
 
-/// "cannot WHAT PATH: WORDS", with the system's own words for `code`.
+/// "cannot WHAT PATH: WORDS", with the system's own text for `code`.
 Error systemError(std::string_view what, std::string_view path, int code = errno);
 
 }  // namespace tavrel

@@ -1,7 +1,8 @@
-// The lock under which one process folds at a time, and what folds have told the log already.
+// The lock under which one process folds at a time, and the refusals that folds have logged
+// already.
 //
-// A file that is refused stays where it is, and every fold meets it again. The lock's file, which
-// lives until the device restarts, remembers what was told.
+// A refused file stays where it is, so every fold meets it again. The lock file, which lives until
+// the device restarts, remembers which lines were logged.
 #pragma once
 
 #include <cstdint>
@@ -20,20 +21,20 @@ namespace tavrel {
 
 class FoldNotes {
  public:
-  /// Waits for another fold, for ten minutes at most. The log must outlive the notes.
+  /// Waits at most ten minutes for another fold to end. The log must outlive the notes.
   static Expected<FoldNotes> lock(const DeviceRoot& root, FileSystem& files, SystemLog& log);
 
-  /// Writes a line to the log unless it was told before or is one too many. True when it is new, or
-  /// when too many were told to know.
+  /// Logs a line, unless it was seen before or is one too many. True when it is new, or when too
+  /// many are remembered to know.
   bool tell(std::string_view line);
 
-  /// Marks that a transaction has taken values. Comes before the segments lose them.
+  /// Marks that a transaction has taken values. Call it before the segments lose them.
   void mark();
-  /// The time of the last mark, for who reads the store and then the segments: when it is the same
-  /// before and after, no value was missed in between.
+  /// The time of the last mark, for readers of the store and then the segments: when it is the same
+  /// before and after, they missed no value in between.
   static timespec lastMark(const DeviceRoot& root);
 
-  /// Keeps what was told for the next fold. Says how many lines were one too many.
+  /// Saves which lines were seen, for the next fold. Logs how many were too many to list.
   void save();
 
  private:
@@ -41,7 +42,7 @@ class FoldNotes {
 
   Descriptor file_;
   SystemLog& log_;
-  std::unordered_set<std::uint64_t> told_;  // the beginnings of SHA-256 digests
+  std::unordered_set<std::uint64_t> told_;  // first 8 bytes of the lines' SHA-256
   bool hasChanged_ = false;
   std::uint64_t leftOut_ = 0;
 };

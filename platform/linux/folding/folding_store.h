@@ -1,4 +1,5 @@
-// The statistics store of a device whose programs record into segments: its checkpoint folds first.
+// The statistics store of a device whose programs record into segments: each checkpoint folds the
+// segments first.
 #pragma once
 
 #include <memory>
@@ -21,8 +22,7 @@ class FoldingStore final : public StatisticsStore {
   plist::Date dateForDaysSince1970(std::int32_t day) override {
     return store_.dateForDaysSince1970(day);
   }
-  /// A failed fold is a line in the log, once, and does not change the outcome: segments keep what
-  /// they hold.
+  /// Logs a failed fold once. It does not change the result: the segments keep what they hold.
   bool BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     store_.BHClientSetValueForScalarKey(key, value);

@@ -1,4 +1,4 @@
-// The store and what waits for the next fold, read as one.
+// The store and the values that wait for the next fold, read as one.
 //
 //   auto history = RecordedHistory::open(root, store, recorders, selection);
 //   if (history) history->walkScalars(handler);
@@ -19,8 +19,8 @@ namespace tavrel {
 
 class RecordedHistory {
  public:
-  /// Later changes of the store and of the segments are not seen. Where this user may not read the
-  /// store, only what waits is read, and `warning` says so.
+  /// Later changes of the store and of the segments are not seen. When this user may not read the
+  /// store, only the waiting values are read, and `warning` says so.
   static Expected<RecordedHistory> open(const DeviceRoot& root, SqliteStore& store,
                                         const Recorders& recorders, RowSelection selection);
 
@@ -31,7 +31,7 @@ class RecordedHistory {
   /// The first and the last day with a row, selected or not; nothing when there is none.
   Expected<std::optional<SqliteHistory::DaySpan>> daysHeld();
 
-  /// What is missing, for people.
+  /// Says, for people, what is missing.
   const std::optional<std::string>& warning() const { return warning_; }
 
  private:
@@ -40,8 +40,8 @@ class RecordedHistory {
   Status walkStoredDistributions(const SqliteHistory::CountedRowHandler& rowHandler);
 
   RowSelection selection_;
-  std::unique_ptr<SqliteHistory> stored_;  // may be missing
-  std::optional<WaitingValues> waiting_;   // nothing without a folder
+  std::unique_ptr<SqliteHistory> stored_;  // null when unreadable
+  std::optional<WaitingValues> waiting_;   // nothing without a segment folder
   std::optional<std::string> warning_;
 };
 

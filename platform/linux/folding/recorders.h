@@ -1,12 +1,13 @@
 // Which user may record which key.
 //
-// A property list gives users prefixes of their own: a dictionary from a user, by name or number,
-// to an array of prefixes.
+// A property list reserves key prefixes for users: a dictionary from a user, by name or number, to
+// an array of prefixes.
 //
 //  - Root records any key.
-//  - Of the prefixes with which a key begins, the longest decides: only its users record the key.
-//  - A key without a prefix is free, except for users that are listed, who keep to their prefixes.
-//  - Keys that begin with "com.norvane." are the system's: a user needs a prefix that begins so.
+//  - Of the listed prefixes of a key, the longest decides: only its users may record the key.
+//  - Anybody may record a key without a listed prefix, except listed users, who keep to theirs.
+//  - Keys that begin with "com.norvane." are the system's: a user needs a listed prefix that begins
+//    with it.
 #pragma once
 
 #include <cstdint>
@@ -26,12 +27,12 @@ namespace tavrel {
 
 class Recorders {
  public:
-  /// Nobody is listed.
+  /// With no user listed.
   Recorders() = default;
 
-  /// What /etc/tavrel/recorders.plist says. A file that is damaged, that users other than root and
-  /// this user could have written, or that is a link that leads nowhere, counts as absent, with a
-  /// line in the log; so does each entry that is not understood.
+  /// Reads /etc/tavrel/recorders.plist. A file that is damaged, that users other than root and this
+  /// user could have written, or that is a dangling link counts as absent, with a line in the log;
+  /// so does each entry that is not understood.
   static Recorders read(const DeviceRoot& root, FileSystem& files,
                         PropertyListCoding& propertyLists, SystemLog& log);
 

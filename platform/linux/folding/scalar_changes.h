@@ -1,6 +1,6 @@
-// Changes of scalars that several segments yield, until one transaction takes them.
+// Collects the scalar changes of several segments for one transaction.
 //
-// Of sets of one row the latest counts, by the time that its program saw; adds are added to it.
+// Of several sets of a row, the latest by its program's clock counts; adds are added to it.
 #pragma once
 
 #include <cstddef>
@@ -38,14 +38,14 @@ class ScalarChanges {
     std::int64_t added = 0;
   };
 
-  /// `added`: what was added to the row so far, also in earlier transactions.
+  /// `added`: the total added to the row so far, including earlier transactions.
   void set(std::int32_t day, std::string_view key, std::int64_t value, std::int64_t added);
   void add(std::int32_t day, std::string_view key, std::int64_t amount);
 
   const RowMap<Change>& rows() const { return changes_; }
-  /// Of the keys.
+  /// Memory of the keys.
   std::size_t bytes() const { return bytes_; }
-  /// Changes that would take a value beyond 64 bits, and are left out.
+  /// The number of changes left out because the value would overflow 64 bits.
   std::uint64_t overflows() const { return overflows_; }
 
   Status giveTo(SqliteBatch& batch);

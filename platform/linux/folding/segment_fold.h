@@ -3,9 +3,9 @@
 //   SegmentFold fold(root, store, files, propertyLists, log);
 //   const FoldReport report = fold.run();
 //
-// The transaction that takes the values of a segment also keeps how far it was read. Only then are
-// its parts given back to the program, or the segment is removed when no program can write to it
-// any more. A process that is killed anywhere in between leaves what the next fold completes.
+// The transaction that takes the values of a segment also keeps how far it was read. Only then is
+// the space given back to the program, or the segment removed when no program can write to it any
+// more. When a process is killed at any point, the next fold completes its work.
 #pragma once
 
 #include <cstdint>
@@ -28,9 +28,9 @@ struct FoldReport {
   std::uint64_t values = 0;            // measurements
   std::uint64_t removed = 0;           // segments that nobody will write to any more
   std::uint64_t waiting = 0;           // segments left for the next fold, because of a limit
-  std::uint64_t dropped = 0;           // values that the programs had no room for
+  std::uint64_t dropped = 0;           // values for which the programs had no room
   std::uint64_t refused = 0;           // values that were not taken
-  std::uint64_t segmentsRefused = 0;   // files that no earlier fold refused
+  std::uint64_t segmentsRefused = 0;   // files refused for the first time
   std::optional<std::string> failure;  // why the fold ended early: what is left waits
 };
 

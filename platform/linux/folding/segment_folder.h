@@ -1,5 +1,5 @@
-// The folder in which programs leave their segments. Any user of its group creates files there, so
-// nothing of an entry is taken on trust, neither its name nor its kind.
+// The folder in which programs leave their segments. Any user of its group can create files there,
+// so nothing about an entry is trusted, neither its name nor its kind.
 #pragma once
 
 #include <cstddef>
@@ -19,7 +19,7 @@
 
 namespace tavrel {
 
-/// A file in the folder that looks like a segment from outside.
+/// A file in the folder that looks like a segment, not opened yet.
 struct SegmentEntry {
   std::string name;
   std::uint32_t owner = 0;
@@ -33,37 +33,38 @@ struct OpenSegment {
   ino_t inode = 0;
 };
 
-/// What came of opening a segment: nothing when it has gone.
+/// The result of opening a segment; both members are empty when it has gone.
 struct SegmentOpening {
   std::optional<OpenSegment> segment;
-  std::string refusal;  // the line, for people, about a file that is refused
+  std::string refusal;  // why it was refused, a line for people
 };
 
 class SegmentFolder {
  public:
   /// Nothing when the device has no folder. An error when it is not on a tmpfs.
   static Expected<std::optional<SegmentFolder>> open(const DeviceRoot& root);
-  /// Whether `open` fails because this user may not read the folder, or nothing in it is folded.
+  /// Whether `open` fails because this user may not read the folder, or because nothing in it is
+  /// ever folded.
   static bool isOutOfReach(const DeviceRoot& root);
 
   const std::string& path() const { return path_; }
 
   struct Listing {
     std::vector<SegmentEntry> segments;  // by name: those that began earlier come first
-    /// Segments that were left out, by owner. Of too many, a random choice is listed, so that each
-    /// gets its turn.
+    /// Segments that were left out, by owner. When there are too many, a random choice is listed,
+    /// so that each gets its turn.
     std::map<std::uint32_t, std::uint64_t> leftOut;
-    /// Owners of files that are refused only as long as they have several names.
+    /// Owners of files that are refused only while they have several names (hard links).
     std::set<std::uint32_t> linked;
     std::vector<std::string> refusals;  // lines for people
-    bool isWhole = true;                // no entry of the folder was left unseen
+    bool isWhole = true;                // every entry of the folder was seen
   };
   /// At most `limits::kSegmentsPerUser` of each owner, `limits::kSegments` in all, out of the first
   /// `mostFiles`.
   Expected<Listing> list(std::size_t mostFiles = limits::kSegmentFolderEntries) const;
 
-  /// Opens a segment for reading. An error says that the system cannot do so now: nothing is known
-  /// of the segment then.
+  /// Opens a segment for reading. An error means that the system cannot do so now; it says nothing
+  /// about the segment.
   Expected<SegmentOpening> openSegment(const SegmentEntry& entry) const;
   /// Opens the same file for writing.
   Descriptor openToAcknowledge(const OpenSegment& segment) const;
@@ -71,11 +72,11 @@ class SegmentFolder {
   bool remove(const OpenSegment& segment) const;
 
   static constexpr std::string_view kRemoveIt = "remove it";
-  /// The line, for people, about a file that is refused: why, and what to do.
+  /// A line for people about a refused file: why, and what to do.
   std::string refusal(std::string_view name, std::string_view reason,
                       std::string_view advice = kRemoveIt) const;
 
-  /// Takes the request for a fold back. An error when that is impossible.
+  /// Withdraws the request for a fold.
   Status clearRequest() const;
 
  private:

@@ -1,4 +1,4 @@
-// Takes what one segment yields, as far as rights and limits allow.
+// Takes the values of one segment, as far as rights and limits allow.
 #pragma once
 
 #include <cstdint>
@@ -25,7 +25,7 @@ class FoldedRows {
     std::int64_t added = 0;
   };
 
-  /// Nothing when the row would be one too many. The first user of a row is charged with it.
+  /// Null when the row would be one too many. A row counts for the user who changes it first.
   Row* find(std::uint32_t user, std::int32_t day, std::string_view key, bool isScalar);
 
   std::size_t size() const { return rows_.size(); }
@@ -58,11 +58,11 @@ class SegmentIntake final : public SegmentSink {
 
  private:
   using Series = PendingDistributions::Series;
-  // Of a key, the series that was used last.
+  // The series that a key used last.
   struct RecentSeries {
     std::int32_t day = 0;
     bool isKnown = false;
-    Series* series = nullptr;  // none: its measurements are refused
+    Series* series = nullptr;  // null: measurements are refused
   };
   bool mayTake(std::string_view key, std::int32_t day);
   Series* findSeries(const SegmentRecord& record);

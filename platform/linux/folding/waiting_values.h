@@ -1,5 +1,5 @@
-// What programs recorded and no fold has taken yet, for who looks at the store. Reading changes
-// nothing in the segments.
+// Recorded values that no fold has taken yet, for viewers of the store. Reading changes nothing in
+// the segments.
 #pragma once
 
 #include <cstdint>
@@ -22,10 +22,10 @@ namespace tavrel {
 /// Which rows are wanted.
 struct RowSelection {
   std::string key;
-  bool isPrefix = true;  // of the keys; otherwise the one key
+  bool isPrefix = true;  // `key` is a prefix, not one whole key
   std::int32_t firstDay = 0;
   std::int32_t lastDay = 0;  // included
-  bool hasValues = true;     // whether measurements are wanted, or only how many there are
+  bool hasValues = true;     // whether measurements or only their count are wanted
 
   bool contains(std::int32_t day, std::string_view name) const {
     return day >= firstDay && day <= lastDay && (isPrefix ? name.starts_with(key) : name == key);
@@ -34,13 +34,13 @@ struct RowSelection {
 
 class WaitingValues {
  public:
-  /// The measurements of one row: where they are among the copied ones.
+  /// Where the measurements of one row are among the copied ones.
   struct Series {
     struct Block {
-      std::uint64_t first;  // number of a measurement
+      std::uint64_t first;  // index among all copied measurements
       std::uint64_t count;
     };
-    /// Between two measurements: the block of the next one, and its number there.
+    /// A reading position: the block of the next measurement, and its index there.
     struct Place {
       std::size_t block = 0;
       std::uint64_t offset = 0;
@@ -49,8 +49,8 @@ class WaitingValues {
     std::int64_t count = 0;
   };
 
-  /// Reads all segments that this user may read, each from where `history` says; without a history
-  /// from its start.
+  /// Reads all segments that this user may read, each from the position in `history`, or from its
+  /// start without a history.
   static Expected<WaitingValues> read(const SegmentFolder& folder, const Recorders& recorders,
                                       SqliteHistory* history, const RowSelection& selection);
 
@@ -60,7 +60,7 @@ class WaitingValues {
   /// began to fold them.
   std::uint64_t leftOut() const { return leftOut_; }
 
-  /// The next measurements of the row, at most as many as fit; 0 at its end. Moves `place` behind
+  /// The next measurements of the row, at most as many as fit; 0 at its end. Moves `place` past
   /// them.
   Expected<std::size_t> readSeries(const Series& series, Series::Place& place,
                                    std::span<DistributionSample> into) const;
@@ -75,7 +75,7 @@ class WaitingValues {
   ScalarChanges scalars_;
   RowMap<Series> distributions_;
   std::uint64_t leftOut_ = 0;
-  // Measurements in the order of segments, in memory of the kernel that is not mapped.
+  // Measurements in the order of segments, in an unmapped memory file.
   Descriptor copied_;
   std::uint64_t copies_ = 0;
   std::size_t blocks_ = 0;

@@ -1,5 +1,5 @@
-// libatasmart, loaded when a SATA disk is read: most devices have none, and every start of a
-// program that links the library would pay for it and for libudev.
+// libatasmart, loaded only when a SATA disk is read: most devices have none, and a program linked
+// with the library would load it and libudev at every start.
 #pragma once
 
 // The library's header uses size_t and does not declare it.

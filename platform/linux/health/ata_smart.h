@@ -11,7 +11,7 @@ namespace tavrel::health {
 
 std::span<const FigureKind> ataKinds();
 
-/// From what `DeviceCommands::ataSmart` yields, a blob of libatasmart.
+/// Reads the libatasmart blob that `DeviceCommands::ataSmart` returns.
 Expected<Figures> ataFigures(ByteSpan blob);
 
 }  // namespace tavrel::health

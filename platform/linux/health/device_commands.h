@@ -16,9 +16,9 @@ class DeviceCommands {
 
   /// A log page of the controller whose device file is `path`. Needs CAP_SYS_ADMIN.
   virtual Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) = 0;
-  /// The register of the whole card, not of a partition. Needs CAP_SYS_RAWIO.
+  /// The EXT_CSD register. `path` names the whole card, not a partition. Needs CAP_SYS_RAWIO.
   virtual Expected<Bytes> extCsd(const std::string& path) = 0;
-  /// SMART data as a blob of libatasmart; nothing inside when the disk's platters stand still.
+  /// SMART data as a libatasmart blob; empty when the disk is spun down.
   virtual Expected<Bytes> ataSmart(const std::string& path) = 0;
 };
 

@@ -1,4 +1,4 @@
-// The drives of the machine whose health can be told, as sysfs shows them.
+// The drives of the machine whose health can be read, as sysfs shows them.
 #pragma once
 
 #include <cstdint>
@@ -33,7 +33,7 @@ struct Drive {
 /// By kind and number.
 std::vector<Drive> findDrives(const Machine& machine);
 
-/// Of this boot; empty when it cannot be read.
+/// The ID of this boot; empty when it cannot be read.
 std::string bootIDOf(const DeviceRoot& root);
 
 }  // namespace tavrel::health

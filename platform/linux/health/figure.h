@@ -1,8 +1,8 @@
-// Health figures of drives: what each is called, where it comes from and what it means.
+// Health figures of drives: their names, sources and meanings.
 //
-// Each kind of drive has tables of `FigureKind`, from which its reader, the documents of the tool
-// and the stored readings are made. A drive that does not tell a figure lacks it; there is no value
-// for "unknown".
+// Each kind of drive has tables of `FigureKind`, which drive its reader, the tool's documents and
+// the stored readings. A figure that a drive does not report is absent; there is no value for
+// "unknown".
 #pragma once
 
 #include <cstdint>
@@ -13,7 +13,7 @@
 
 namespace tavrel::health {
 
-/// Unit codes as report channels have them: the quantity in the top byte, the scale below.
+/// Unit codes, as in report channels: the quantity in the top byte, the scale below.
 using Unit = std::uint64_t;
 inline constexpr Unit kPlain = 0;  // percentages, states, hours: the name says which
 inline constexpr Unit kBytes = 0x0900820000000000;
@@ -23,20 +23,20 @@ inline constexpr Unit kEvents = 0x6400000000000000;
 enum class DriveKind : std::uint8_t { Nvme, Emmc, Ufs, Ata, Mtd, Ubi };
 std::string_view nameOf(DriveKind kind);
 
-/// How a figure goes on.
+/// How a figure changes over time.
 enum class Course : std::uint8_t {
   Gauge,     // up and down
   Lifetime,  // a counter that the drive keeps
   Attached,  // a counter that starts from zero when the kernel attaches the drive
 };
 
-/// Where a figure stands in a log page, little-endian.
+/// Where a figure is in a log page, little-endian.
 struct Place {
   std::uint16_t offset = 0;
   std::uint16_t width = 0;       // bytes, at most 16
   std::uint32_t multiplier = 1;  // to the unit
   bool zeroIsUnknown = false;
-  std::uint8_t largest = 255;  // of one-byte fields: what is more makes no sense and is dropped
+  std::uint8_t largest = 255;  // for one-byte fields: higher values are nonsense, and dropped
 };
 
 struct FigureKind {
@@ -54,7 +54,7 @@ struct Figure {
 };
 using Figures = std::vector<Figure>;
 
-/// Nothing when the drive does not tell it.
+/// Null when the drive does not report it.
 const std::int64_t* valueOf(const Figures& figures, std::string_view name);
 
 /// The kind of that name, null when there is none.

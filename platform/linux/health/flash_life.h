@@ -1,5 +1,5 @@
-// eMMC and UFS, which tell their wear in steps of a tenth: the card's EXT_CSD register, and the
-// texts of both in sysfs.
+// eMMC and UFS, which report their wear in steps of a tenth: the card's EXT_CSD register, and the
+// sysfs texts of both.
 #pragma once
 
 #include <optional>

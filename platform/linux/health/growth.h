@@ -1,10 +1,10 @@
 // How much counters have grown since the previous daily run.
 //
-// The reader remembers each drive by its identity, so that a drive moved to another port goes on
-// counting and a new one in its place starts from zero. Between two readings a counter grows by
-// their difference. A counter that the kernel keeps begins at 0 in every boot, or when it goes
-// back. A counter of the drive that goes back has no growth until the next daily run: nobody knows
-// what was lost.
+// The reader remembers each drive by its identity, so a drive moved to another port goes on
+// counting, and a new one in its place starts from zero. Between two readings a counter grows by
+// their difference. A counter that the kernel keeps restarts at 0 in every boot, and whenever it
+// goes back. A counter of the drive that goes back has no growth until the next daily run: nobody
+// knows what was lost.
 #pragma once
 
 #include <cstdint>
@@ -30,14 +30,14 @@ struct DriveMemory {
   std::set<std::string, std::less<>> lost;  // counters whose growth is unknown
 };
 
-/// What is common to the readings of one moment.
+/// Facts common to the readings of one moment.
 struct Moment {
   std::int64_t seconds = 0;            // since 1970
   std::string boot;                    // its ID
-  std::optional<std::int64_t> runDay;  // the day that the last daily run has done
+  std::optional<std::int64_t> runDay;  // the day of the last daily run
 };
 
-/// Takes over a reading; yields the growth of its counters, as figures of the counters' kinds.
+/// Adds a reading to the memory; returns the growth of its counters, as figures of the same kinds.
 Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& moment);
 
 /// All that the reader remembers.
@@ -45,8 +45,7 @@ struct Memory {
   std::map<std::string, DriveMemory, std::less<>> drives;  // by identity
   std::map<std::string, bool, std::less<>> hasOcpLog;      // by model and firmware
 
-  /// Drops drives that were last seen more than `limits::kDriveMemorySeconds` before. Says whether
-  /// there were any.
+  /// Drops drives last seen more than `limits::kDriveMemorySeconds` ago. True when there were any.
   bool forgetOld(std::int64_t now);
 };
 

@@ -1,4 +1,4 @@
-// Takes figures out of log pages by a table of places.
+// Extracts figures from log pages by a table of places.
 #pragma once
 
 #include <span>
@@ -8,11 +8,11 @@
 
 namespace tavrel::health {
 
-/// Appends what the page tells. Values beyond 2^63-1 become that. A field of two bytes or more in
-/// which all bits are set, and a field that the page is too short for, is left out.
+/// Appends the figures of a page. Values beyond 2^63-1 become 2^63-1. A field of two bytes or more
+/// in which all bits are set, or one beyond the end of the page, is left out.
 void appendFields(ByteSpan page, std::span<const FigureKind> kinds, Figures& figures);
 
-/// Whether all bytes are the same, as in the answer of a drive that gives none.
+/// Whether all bytes are the same, as in the page of a drive that does not fill it.
 bool isBlank(ByteSpan page);
 
 }  // namespace tavrel::health

@@ -1,4 +1,4 @@
-// Raw flash: MTD devices and the UBI layer over them, whose figures are files of sysfs.
+// Raw flash: MTD devices and the UBI layer over them, whose figures are sysfs files.
 #pragma once
 
 #include <span>

@@ -15,15 +15,15 @@ inline constexpr std::size_t kNvmeLogBytes = 512;
 
 std::span<const FigureKind> nvmeSmartKinds();
 std::span<const FigureKind> nvmeOcpKinds();
-/// What follows from both logs.
+/// Figures computed from both logs.
 std::span<const FigureKind> nvmeDerivedKinds();
 
 /// Refuses a page of another size and one whose bytes are all the same.
 Expected<Figures> nvmeSmartFigures(ByteSpan page);
-/// Refuses a page without the log's GUID, too: C0h is the vendor's to use as he likes.
+/// Refuses a page without the log's GUID, too: vendors may use C0h for anything.
 Expected<Figures> nvmeOcpFigures(ByteSpan page);
-/// Appends the write amplification when the figures have what was written to the media and by the
-/// host.
+/// Appends the write amplification when the figures include the bytes written to the media and by
+/// the host.
 void appendNvmeDerived(Figures& figures);
 
 }  // namespace tavrel::health

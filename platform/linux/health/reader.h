@@ -1,4 +1,4 @@
-// Reads all drives of the machine and leaves their readings for everybody.
+// Reads all drives of the machine and stores their readings where everybody can read them.
 #pragma once
 
 #include <optional>
@@ -17,8 +17,8 @@ namespace tavrel::health {
 /// Remembered counters, and which drives have the OCP log. Only root may read it.
 inline constexpr std::string_view kMemoryFile = "/var/lib/tavrel/health/memory.plist";
 
-/// Figures that take no command to the drive, for kinds that tell any that way. The reading's
-/// error is set when the drive sleeps or shows nothing.
+/// Figures that need no command to the drive, for the kinds of drive that have such figures. Sets
+/// the reading's error when the drive is asleep or shows nothing.
 Reading readWithoutCommands(const Drive& drive);
 
 class HealthReader {
@@ -27,9 +27,9 @@ class HealthReader {
   HealthReader(const DeviceRoot& root, FileSystem& files, DeviceCommands& commands, SystemLog& log)
       : root_(root), files_(files), commands_(commands), log_(log) {}
 
-  /// False when a reading or the memory could not be written. A drive that sleeps keeps its earlier
-  /// reading; that of a drive that has gone is removed; one that cannot be read has a reading that
-  /// says why.
+  /// False when a reading or the memory could not be written. A sleeping drive keeps its earlier
+  /// reading, the reading of a drive that has gone is removed, and the reading of a drive that
+  /// cannot be read says why.
   bool readAll(std::int64_t nowSeconds);
 
  private:

@@ -32,13 +32,13 @@ struct Reading {
   std::optional<std::int64_t> capacity;  // bytes
   std::int64_t time = 0;                 // seconds since 1970
   std::string boot;
-  std::string from;   // what was asked
+  std::string from;   // the log or file that was read
   std::string error;  // empty when the drive answered
   Figures figures;
   Figures growth;  // since the previous daily run
 };
 
-/// A reading that lacks everything but what is known of the drive.
+/// A reading without figures: it says only which drive it is about.
 Reading emptyReading(const Drive& drive);
 
 Expected<std::string> encodeReading(const Reading& reading);
@@ -51,8 +51,8 @@ struct Readings {
 };
 Readings loadReadings(const DeviceRoot& root, FileSystem& files);
 
-/// A figure of a drive under a name that no other has ("nvme0.spare_pct"). The growth of a counter
-/// is a figure of its own ("nvme0.written_growth").
+/// A figure of a drive under a unique name ("nvme0.spare_pct"). The growth of a counter is a figure
+/// of its own ("nvme0.written_growth").
 struct NamedFigure {
   std::string name;
   Unit unit;

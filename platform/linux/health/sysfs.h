@@ -9,8 +9,8 @@
 
 namespace tavrel::health {
 
-/// The text of an attribute without blanks at its ends; nothing when it is missing, cannot be read
-/// or is empty. At most 4 KiB are read, and only of a regular file.
+/// The text of an attribute without leading and trailing blanks; nothing when it is missing, cannot
+/// be read or is empty. At most 4 KiB are read, and only of a regular file.
 std::optional<std::string> readAttribute(const std::string& path);
 
 /// A decimal number that is the whole text.
@@ -20,7 +20,7 @@ std::optional<std::int64_t> readNumber(const std::string& path);
 /// An attribute as text for people and file formats: printable ASCII, at most 64 characters.
 std::string readLabel(const std::string& path);
 
-/// Names in a folder by their numbers ("nvme2" before "nvme10"); none for a missing one.
+/// Names in a folder, in numeric order ("nvme2" before "nvme10"); none for a missing folder.
 std::vector<std::string> namesIn(const std::string& folder);
 
 /// Whether `name` is `prefix` followed by digits only.
@@ -29,7 +29,7 @@ bool isNumbered(std::string_view name, std::string_view prefix);
 /// `path` with links resolved; empty when there is no such file.
 std::string resolved(const std::string& path);
 
-/// Whether the device at `path`, or one that it hangs on, sleeps: reading would wake it.
+/// Whether the device at `path`, or one above it, is suspended: reading would wake it.
 bool isAsleep(const std::string& path);
 
 }  // namespace tavrel::health

@@ -1,6 +1,6 @@
-// How much of the device's storage may be used, and by what.
+// How much of the device's storage each kind of content may use.
 //
-// /etc/tavrel/limits.plist has a dictionary for each kind of which it changes the bounds:
+// /etc/tavrel/limits.plist has a dictionary for each kind whose bounds it changes:
 //
 //   {"Store": {"Days": 365, "Bytes": 67108864}, "Outbox": {"Bytes": 1048576}}
 #pragma once
@@ -20,7 +20,7 @@ namespace tavrel {
 
 inline constexpr std::string_view kLimitsPath = "/etc/tavrel/limits.plist";
 
-/// What takes storage. The values are places in `kKeptKinds`.
+/// The kinds of content that take storage. The values are indices into `kKeptKinds`.
 enum class Kept : std::uint8_t {
   Store,
   Pending,
@@ -33,7 +33,7 @@ enum class Kept : std::uint8_t {
 };
 
 struct Bounds {
-  std::int64_t days = 0;   // days of which something is held, whatever their dates
+  std::int64_t days = 0;   // number of days with content, whatever their dates
   std::int64_t bytes = 0;  // of files, in whole blocks; of the store, pages in use
 };
 
@@ -41,11 +41,11 @@ inline constexpr std::int64_t kAnyDays = std::numeric_limits<std::int64_t>::max(
 
 struct KeptKind {
   Kept kind;
-  std::string_view name;       // in the file of limits
+  std::string_view name;       // key in the limits file
   std::string_view label;      // for people
-  std::string_view item;       // what is removed at once, for people
-  std::string_view statistic;  // counts what was removed
-  Bounds bounds;               // when the file does not say
+  std::string_view item;       // the unit of removal, for people
+  std::string_view statistic;  // counts removals
+  Bounds bounds;               // default
 };
 
 inline constexpr std::int64_t kMebibyte = 1 << 20;

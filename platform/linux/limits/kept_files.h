@@ -2,8 +2,8 @@
 //
 // No file is removed for its age, since the clock may be wrong: a device without a battery begins
 // in 1970, and a mistyped date may be years ahead. What counts is how many days have files, and how
-// many bytes they take. Of files that are too many, those dated after tomorrow go first, then the
-// oldest; so a clock that was wrong for a while costs what it left itself.
+// many bytes they take. When there are too many, files dated after tomorrow go first, then the
+// oldest; so a clock that was ahead for a while costs only the files of that time.
 #pragma once
 
 #include <cstdint>
@@ -18,16 +18,16 @@
 
 namespace tavrel {
 
-/// True for a day that has not come: it was recorded while the clock was ahead.
+/// True for a day in the future: it was recorded while the clock was ahead.
 constexpr bool isAhead(std::int64_t day, std::int64_t today) {
   return day > today + 1;
 }
 
-/// What is removed at once: a log with its metadata, or one file.
+/// The unit of removal: a log with its metadata, or one file.
 struct KeptFile {
   std::string path;
-  std::string companion;     // removed after it, once its removal has become durable; or empty
-  std::int64_t seconds = 0;  // since 1970, as its name says, otherwise as it was last changed
+  std::string companion;     // removed once the removal of `path` is durable; or empty
+  std::int64_t seconds = 0;  // since 1970, from its name or else its last change
   std::int64_t bytes = 0;    // of both, in whole blocks
 
   std::int64_t day() const;
@@ -41,7 +41,7 @@ struct KeptUse {
 
 struct TrimmedFiles {
   std::int64_t removed = 0;
-  Status status = Done{};  // why not all went that should
+  Status status = Done{};  // why not everything was removed
 };
 
 class KeptFiles {
@@ -74,7 +74,7 @@ class KeptFiles {
   FileSystem& fileSystem_;
   std::int64_t today_;
   std::string folder_;
-  std::vector<KeptFile> list_;  // the first to go first
+  std::vector<KeptFile> list_;  // in order of removal
   std::vector<std::string> orphans_;
 };
 

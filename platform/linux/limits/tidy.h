@@ -1,7 +1,7 @@
 // Keeps the device's storage within its limits.
 //
 // Files go first, because removing them needs no room; on a full disk the store can then be
-// shortened too. What went is counted in statistics of the day.
+// shortened too. Statistics of the day count what was removed.
 #pragma once
 
 #include <cstdint>
@@ -20,7 +20,7 @@
 
 namespace tavrel {
 
-/// A line for each thing that the last tidy could not do; missing when there was nothing.
+/// A line for each failure of the last tidy; missing when there was none.
 inline constexpr std::string_view kTidyFailuresFile = "/var/lib/tavrel/tidy-failures";
 
 /// Counts `TidiedKind::early`. A store that is as old as its limit gives up a day each day; one
@@ -32,8 +32,8 @@ struct TidiedKind {
   const KeptKind* kind = nullptr;
   Bounds bounds;
   std::int64_t removed = 0;        // items
-  std::int64_t early = 0;          // of these, days of the store that its limit of days would keep
-  std::vector<std::int32_t> days;  // of the store, those that went
+  std::int64_t early = 0;          // of these, days of the store within its limit of days
+  std::vector<std::int32_t> days;  // of the store, the removed ones
   bool exceeds = false;            // what must stay takes more than the store's bounds
 };
 
@@ -60,11 +60,11 @@ class Tidy {
         preferences_(preferences),
         store_(store) {}
 
-  /// Removes what exceeds the limits. While another process does so, waits for it. What fails is
-  /// left in `kTidyFailuresFile`.
+  /// Removes what exceeds the limits. Waits while another process does so. Writes failures to
+  /// `kTidyFailuresFile`.
   TidyReport run();
 
-  /// What is held, beside its bounds. Changes nothing.
+  /// What is stored, with its bounds. Changes nothing.
   Expected<std::vector<MeasuredKind>> measure();
 
  private:

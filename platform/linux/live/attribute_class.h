@@ -1,4 +1,4 @@
-// Devices that the kernel shows as folders with one number in each file: sensors, batteries,
+// Devices that the kernel shows as folders with one number per file: sensors, batteries,
 // regulators, memory controllers. A table says which files are figures.
 #pragma once
 
@@ -11,7 +11,7 @@
 
 namespace tavrel::live {
 
-/// One figure of a device. In the names of file and channel '*' stands for the same number.
+/// One figure of a device. A '*' in `file` and `channel` stands for the same number.
 struct Attribute {
   std::string_view file;
   std::string_view channel;
@@ -25,21 +25,21 @@ struct DeviceClass {
   std::string_view name;
   std::string_view group;
   std::string_view folder;
-  std::string_view entry;  // how the folders of devices begin
-  /// File with a device's name; without one, the folder's name serves. Devices of one name also
-  /// get that of the device that they belong to, or their folder's.
+  std::string_view entry;  // prefix of the devices' folders
+  /// File with a device's name; without one, the folder's name is used. Devices that share a name
+  /// also get the name of the device they belong to, or of their folder.
   std::string_view label;
   bool alwaysWithDevice;
   Speed speed;
   std::span<const Attribute> attributes;
-  std::string_view part = {};  // how folders of parts of a device begin
+  std::string_view part = {};  // prefix of the folders of a device's parts
   std::span<const Attribute> partAttributes = {};
 };
 
 void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSource& source);
 
-/// The folders of devices below `folder` and the names that channels have for them. Notes of the
-/// source say when there are more than are shown.
+/// The folders of devices below `folder`, and their names in channels. When there are too many to
+/// show, a note of the source says so.
 struct NamedDevice {
   std::string path;
   std::string name;
@@ -52,7 +52,8 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
 void addAttributes(const std::string& path, const Place& place, const std::string& prefix,
                    std::span<const Attribute> attributes, Speed speed, LiveSource& source);
 
-/// Whether `name` fits a pattern with at most one '*', which stands for digits; those are `number`.
+/// Whether `name` fits a pattern with at most one '*', which stands for digits; sets `number` to
+/// them.
 bool fitsPattern(std::string_view name, std::string_view pattern, std::string_view& number);
 
 }  // namespace tavrel::live

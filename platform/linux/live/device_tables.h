@@ -1,4 +1,4 @@
-// The devices whose figures are single files, and what those mean.
+// The devices whose figures are single files, and the meaning of those files.
 #pragma once
 
 #include <span>
@@ -7,10 +7,10 @@
 
 namespace tavrel::live {
 
-/// One source for each.
+/// Each becomes one source.
 std::span<const DeviceClass> deviceClasses();
 
-/// Of /sys/power/suspend_stats, a folder without devices.
+/// The figures of /sys/power/suspend_stats, a folder without devices.
 std::span<const Attribute> suspendAttributes();
 
 }  // namespace tavrel::live

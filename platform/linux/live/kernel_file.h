@@ -13,7 +13,7 @@
 
 namespace tavrel::live {
 
-/// Descriptors that may stay open, for all files together: half of what the process may have.
+/// How many descriptors may stay open for all files together: half of the process's limit.
 class DescriptorBudget {
  public:
   DescriptorBudget();
@@ -25,14 +25,14 @@ class DescriptorBudget {
 };
 
 enum class ReadMode : std::uint8_t {
-  Once,   // a text that the kernel gives whole when there is room for it
-  ToEnd,  // one that comes in parts
+  Once,   // the kernel returns the whole text if it fits
+  ToEnd,  // the text comes in parts
 };
 
-/// Room for the text of one file at a time. It grows, and is not cleared.
+/// Memory for the text of one file at a time. It grows as needed and is not cleared.
 class TextBuffer {
  public:
-  /// Room for more text behind the first `length` bytes, which stay.
+  /// Space for more text after the first `length` bytes, which are kept.
   std::span<char> roomBehind(std::size_t length);
   std::string_view text(std::size_t length) const { return {bytes_.get(), length}; }
 
@@ -42,7 +42,7 @@ class TextBuffer {
 };
 
 /// Reads a whole file of the kernel into `buffer`, at most `limits::kLiveFileBytes`. Nothing when
-/// it cannot be opened or read. Opening does not wait for anybody.
+/// it cannot be opened or read. Opening never blocks.
 std::optional<std::string_view> readKernelFile(const std::string& path, ReadMode mode,
                                                TextBuffer& buffer);
 
@@ -52,8 +52,8 @@ class KernelFile {
 
   const std::string& path() const { return path_; }
 
-  /// The text as it is now, in `buffer`. Reads through the descriptor of the reading before when
-  /// the budget had one; a file that has meanwhile been replaced is opened again.
+  /// The text as it is now, in `buffer`. Reuses the descriptor of the last read when the budget had
+  /// one; a file that has been replaced since is opened again.
   std::optional<std::string_view> read(DescriptorBudget& budget, TextBuffer& buffer);
 
  private:

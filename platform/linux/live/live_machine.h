@@ -1,10 +1,9 @@
-// All live services of the machine: what its kernel tells, as drivers that publish channels.
+// All live services of the machine: the figures of its kernel, as drivers that publish channels.
 //
 // The files are those below the device root. A root other than "/" shows live services only when it
-// has a folder /proc of its own, and then what that and its folder /sys hold; links to the
-// machine's own folders serve. A root with /sys alone only stands in for a few facts of the
-// hardware. The services are found out on the first request; devices that come later appear in the
-// next process.
+// has a folder /proc of its own, and then those of its /proc and /sys, which may be links to the
+// machine's. A root with /sys alone only stands in for a few facts about the hardware. The services
+// are discovered on the first request; devices that appear later are found by the next process.
 #pragma once
 
 #include <memory>

@@ -2,7 +2,7 @@
 //
 // Values are kept in slots. A file fills a range of slots; a channel shows one slot, an array of
 // them, or for each state of a residency two: first the entries of all states, then their
-// residencies. What a reading does not give is `kUnset`, and its channel is absent.
+// residencies. A value missing from a reading is `kUnset`, and its channel is absent.
 //
 //   LiveSource source("LinuxSwap", "swap");
 //   const std::uint32_t slot = source.addNumberFile(path, {.multiply = 1024});
@@ -46,9 +46,9 @@ struct LiveChannel {
   std::uint16_t elements;
   std::uint32_t firstSlot;
   std::uint32_t slots;
-  std::int32_t states = -1;  // of a residency: its entry in `LiveSource::residency`
+  std::int32_t states = -1;  // of a residency: its index in `residencies_`
 
-  /// As it stands in legends and elements.
+  /// The channel type, as legends and elements contain it.
   std::uint64_t type() const {
     return static_cast<std::uint64_t>(format) | std::uint64_t{categories} << 16 |
            std::uint64_t{elements} << 32;
@@ -58,29 +58,29 @@ struct LiveChannel {
 /// The states of a residency.
 struct Residency {
   std::vector<std::uint64_t> ids;
-  std::vector<std::int64_t> numbers;       // by which the kernel calls them; empty when it does not
+  std::vector<std::int64_t> numbers;       // the kernel's numbers for them; may be empty
   std::uint32_t currentSlot = UINT32_MAX;  // holds the number of the current one
 };
 
-/// What the text of a file means.
+/// Interprets the text of a file.
 class TextReader {
  public:
   virtual ~TextReader() = default;
-  /// Fills `slots`, which are all `kUnset`, as far as the text goes.
+  /// Fills `slots`, which are all `kUnset`, as far as the text has values.
   virtual void read(std::string_view text, std::span<std::int64_t> slots) const = 0;
 };
 
 /// How a file may be read.
 enum class Speed : std::uint8_t {
   Quick,
-  Slow,  // the device behind it may take its time: read last, and only for a bounded time
+  Slow,  // the device behind it may be slow: read last, and only for a bounded time
 };
 
 struct LiveFile {
   KernelFile file;
   std::uint32_t firstSlot;
   std::uint32_t slots;
-  Scale scale;  // of the file's one number, without a reader
+  Scale scale;  // of a file with one number, which has no reader
   std::unique_ptr<const TextReader> reader;
   Speed speed = Speed::Quick;
   std::vector<std::string> powerStatus = {};  // files that say "suspended" while it may not be read
@@ -91,22 +91,22 @@ class LiveSource {
   LiveSource(std::string_view className, std::string_view name)
       : className_(className), name_(name) {}
 
-  // -- What it shows, told by whoever builds it --------------------------------------------------
+  // -- For builders of the source ----------------------------------------------------------------
 
-  /// A file of one number. The slot is the result, here and below.
+  /// A file that holds one number. Returns its first slot, as the functions below do.
   std::uint32_t addNumberFile(std::string path, Scale scale = {}, Speed speed = Speed::Quick,
                               std::vector<std::string> powerStatus = {});
-  /// A file whose text the reader takes apart into so many slots.
+  /// A file whose text the reader splits into that many slots.
   std::uint32_t addTextFile(std::string path, std::uint32_t slots,
                             std::unique_ptr<const TextReader> reader, ReadMode mode);
-  /// A value that a file system or the process itself tells.
+  /// Values that a function measures, not read from a file of the kernel.
   std::uint32_t addMeasured(std::uint32_t slots,
                             std::function<void(std::span<std::int64_t>)> measure);
 
   void addSimple(const Place& place, std::string name, std::uint32_t slot,
                  std::uint16_t categories = kToolCategory);
   void addArray(const Place& place, std::string name, std::uint32_t firstSlot, std::uint32_t slots);
-  /// `firstSlot` begins the entries of the states.
+  /// `firstSlot` is the first of the states' entry counts.
   void addStates(const Place& place, std::string name, std::uint32_t firstSlot,
                  Residency residency);
 
@@ -116,17 +116,17 @@ class LiveSource {
   /// A line for the system log about what is not shown.
   void note(std::string line) { notes_.push_back(std::move(line)); }
   const std::vector<std::string>& notes() const { return notes_; }
-  /// Publishes the folds, in the order in which they were begun. To be called last.
+  /// Publishes the folds, in the order in which they were begun. Call this last.
   void publishFolds();
 
-  // -- For whoever samples -----------------------------------------------------------------------
+  // -- For samplers ------------------------------------------------------------------------------
 
   const std::string& className() const { return className_; }
   const std::string& name() const { return name_; }
   std::uint64_t driverID() const { return stableID(className_ + '/' + name_); }
   bool empty() const { return groups_.empty(); }
 
-  /// The service, as a recording has it.
+  /// The service, in the form of a recording.
   plist::Dictionary service() const;
   template <class Callback>
   void forEachChannel(const Callback& callback) const {
@@ -141,9 +141,9 @@ class LiveSource {
   std::vector<LiveFile>& files() { return files_; }
   /// Marks the files that the channel needs in `wanted`, which has one flag for each.
   void want(const LiveChannel& channel, std::vector<bool>& wanted) const;
-  /// Takes over the text of a file; nothing when it could not be read.
+  /// Stores the values of a file's text; nothing when the file could not be read.
   void takeText(std::size_t file, std::optional<std::string_view> text);
-  /// What remains after all wanted files are read.
+  /// Computes measured values and folds, after all wanted files have been read.
   void finish();
   std::span<const std::int64_t> slots() const { return slots_; }
 

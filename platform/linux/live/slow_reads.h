@@ -1,8 +1,8 @@
-// Reading files behind which a device may keep the reader waiting.
+// Reads files of devices that may keep the reader waiting.
 //
-// A thread reads them one after another. When one of them does not answer in time, another thread
-// goes on with the rest, and the reading ends without it. A file that is still being waited for at
-// the next reading is left out of that, too.
+// A thread reads them one after another. When a file does not answer in time, another thread goes
+// on with the rest, and the reading ends without that file. A later reading leaves it out for as
+// long as the first thread still waits.
 #pragma once
 
 #include <memory>
@@ -16,7 +16,7 @@
 
 namespace tavrel::live {
 
-/// A file that one thread at a time reads. It outlives its owner while a thread waits for it.
+/// A file that only one thread at a time reads. It outlives its owner while a thread waits for it.
 struct SlowFile {
   SlowFile(std::string filePath, bool mayStayOpen)
       : path(std::move(filePath)), staysOpen(mayStayOpen) {}
@@ -36,8 +36,8 @@ class SlowReads {
  public:
   SlowReads(SystemLog& log, Patience patience);
 
-  /// The texts of all files, in their order; nothing for those that failed or did not answer. A
-  /// line names the latter.
+  /// The texts of all files, in their order; nothing for those that failed or did not answer. A log
+  /// line names those that did not answer.
   std::vector<std::optional<std::string>> read(std::vector<std::shared_ptr<SlowFile>> files);
 
  private:
@@ -47,7 +47,7 @@ class SlowReads {
 
   SystemLog& log_;
   const Patience patience_;
-  // Of all readings: a file may still belong to a thread of an earlier one.
+  // Shared by all readings: a file may still belong to a thread of an earlier one.
   const std::shared_ptr<std::mutex> mutex_;
 };
 

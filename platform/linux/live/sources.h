@@ -1,5 +1,5 @@
-// The sources that are not a table of devices. Each adds what the machine has of its facility, and
-// nothing where the kernel shows none of it.
+// The sources that are not a table of devices. Each adds the channels of its facility, and none
+// when the kernel does not show it.
 #pragma once
 
 #include "platform/linux/files/device_root.h"

@@ -1,4 +1,4 @@
-// Texts of the kernel that are tables: a line is a row, a token of it names the row, others are its
+// Kernel texts that are tables: each line is a row, one of its tokens names the row, others are
 // figures. diskstats, vmstat, pressure and residencies all have this form.
 #pragma once
 
@@ -22,18 +22,18 @@ struct TableForm {
   static constexpr std::size_t kNoKey = SIZE_MAX;
 
   std::size_t key = 0;         // token that names the row; `kNoKey` when all lines are one row
-  std::string_view mark = {};  // dropped where it begins a line
+  std::string_view mark = {};  // dropped at the beginning of a line
   std::size_t headings = 0;    // lines before the first row
 };
 
-/// Takes the key of a line and leaves `line` behind the key when that is its first token. Nothing
-/// for headings and empty lines: headings begin with a colon.
+/// Returns the key of a line; when that is the first token, moves `line` past it. Empty for empty
+/// lines and for headings, which begin with a colon.
 std::string_view keyOfLine(std::string_view& line, const TableForm& form);
 
 /// A figure of a row. Tokens are counted from 0, the key included.
 struct Cell {
   std::size_t token;
-  std::uint32_t slot;  // from the row's first
+  std::uint32_t slot;  // relative to the row's first
   Scale scale = {};
 };
 
@@ -51,7 +51,7 @@ class TableReader final : public TextReader {
   std::unordered_map<std::string, std::uint32_t, KeyedHash, std::equal_to<>> rows_;
 };
 
-/// How a figure gets into the daily log: not at all, as it is, or added to a fold of that name.
+/// How a figure enters the daily log: not at all, as it is, or added to the fold of that name.
 struct Daily {
   std::string_view fold = {};
   LiveSource::Fold how = LiveSource::Fold::Sum;
@@ -75,14 +75,14 @@ struct DeviceTable {
   std::string_view group;  // the row is the subgroup
   TableForm form;
   std::span<const Column> columns;
-  std::string_view prefix = {};  // of the keys that are devices
-  std::string_view daily = {};   // folder in which a device of the daily folds has a "device"
-  std::string_view only = {};    // folder in which a device has an entry
+  std::string_view prefix = {};  // of keys that name devices
+  std::string_view daily = {};   // folder where a device that counts in daily folds has a "device"
+  std::string_view only = {};    // if set, only devices with an entry in this folder are shown
 };
 
 void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource& source);
 
-// -- Texts of which some figures are listed -----------------------------------------------------
+// -- Texts with a list of figures to show -------------------------------------------------------
 
 struct Figure {
   std::string_view key;
@@ -102,7 +102,7 @@ struct FigureList {
   ReadMode mode = ReadMode::Once;
 };
 
-/// Publishes those figures of the list that the text at `path` has now.
+/// Publishes those figures of the list that the text at `path` contains now.
 void addFigures(const std::string& path, const FigureList& list, LiveSource& source);
 
 }  // namespace tavrel::live

@@ -1,4 +1,4 @@
-// Which of the languages on offer suit a person's preferences.
+// Finds the available languages that suit a person's preferences.
 #pragma once
 
 #include <string>

@@ -20,9 +20,9 @@ struct LanguageTag {
   friend bool operator==(const LanguageTag&, const LanguageTag&) = default;
 };
 
-/// Reads either form, in any case. The encoding of a locale name does not matter, its modifier
-/// gives the script or the variant when it stands for one. Nothing for "C", "POSIX" and texts that
-/// do not name a language.
+/// Reads either form, in upper or lower case. Ignores the encoding of a locale name; its modifier
+/// may give the script or the variant. Nothing for "C", "POSIX" and texts that do not name a
+/// language.
 std::optional<LanguageTag> parseLanguageTag(std::string_view name);
 
 }  // namespace tavrel

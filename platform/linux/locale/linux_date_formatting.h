@@ -1,8 +1,8 @@
 // Dates as text, in the time zone of the device.
 //
-// The zone comes from /etc/localtime, under the device root or else on the machine; without it, it
-// is UTC. Of the Unicode date-field patterns it supports yyyy, MM, dd, HH, mm, ss and Z; other
-// letters stay unchanged. All fields are digits, so all locales print alike.
+// The zone comes from /etc/localtime, under the device root or else on the machine, and defaults to
+// UTC. Of the Unicode date-field patterns it supports yyyy, MM, dd, HH, mm, ss and Z; other letters
+// stay unchanged. All fields are digits, so all locales print alike.
 #pragma once
 
 #include "platform/date_formatting.h"

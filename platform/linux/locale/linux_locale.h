@@ -3,12 +3,13 @@
 // The variables are those of /etc/locale.conf under the device root, or, when that is missing, of
 // /etc/default/locale: assignments as a shell reads them (NAME=VALUE, NAME="VALUE").
 //
-// - Preferred languages: the first set one of LC_ALL, LC_MESSAGES and LANG names the language of
-//   messages; "C" and "POSIX" stand for none. The list LANGUAGE goes before it, as gettext has it.
-// - Country: the territory of the first set one of LC_ALL, LC_MEASUREMENT and LANG.
-// - System languages: the lines of /etc/tavrel/languages when there is such a file, the language
-//   of untranslated texts first. Else "en" and the locales that are generated: the lines of
-//   /etc/locale.gen and the folders in /usr/lib/locale. Without any, "en" and the preferred ones.
+// - Preferred languages: the first of LC_ALL, LC_MESSAGES and LANG that is set names the language
+//   of messages; "C" and "POSIX" stand for none. As in gettext, the list in LANGUAGE precedes it.
+// - Country: the territory of the first of LC_ALL, LC_MEASUREMENT and LANG that is set.
+// - System languages: the lines of /etc/tavrel/languages if the file exists, the language of
+//   untranslated texts first. Otherwise "en" and the generated locales: the lines of
+//   /etc/locale.gen and the folders in /usr/lib/locale. Without any, "en" and the preferred
+//   languages.
 #pragma once
 
 #include <functional>
@@ -36,8 +37,8 @@ class LinuxLocale final : public Locale {
   using Variables = std::map<std::string, std::string, std::less<>>;
   Variables readVariables();
 
-  /// Calls `use` with each significant line. False when the file is missing; logs once a file that
-  /// exists but cannot be read.
+  /// Calls `use` with each significant line. False when the file is missing. Logs once that an
+  /// existing file cannot be read.
   bool readLines(std::string_view path, const std::function<void(std::string_view line)>& use);
 
   const DeviceRoot& root_;

@@ -1,12 +1,12 @@
-// Crash-reporting support on files.
+// Crash-reporting support in files.
 //
 // Structured records are lines of JSON in
 // /var/mobile/Library/Logs/CrashReporter/StructuredData/<type>-<UTC day>.jsonl, one file per type
-// and day. Each is with the kernel when its call returns; they are written through to storage
-// together, at the clean-up that ends a day's work or with the process; the record of an ECC event
-// at once, since the event then leaves its queue. Until then their files are locked. The support
-// log of other programs, /var/mobile/Library/Logs/NorvaneCare/ support.log, is rolled to
-// support.log.1 and on to support.log.5.
+// and day. A call returns once the kernel has the record. Records are flushed to storage together,
+// at the clean-up that ends a day's work or when the process ends; that of an ECC event at once,
+// since the event then leaves its queue. Until then their files are locked. The support log of
+// other programs, /var/mobile/Library/Logs/NorvaneCare/support.log, is rolled to support.log.1 and
+// on to support.log.5.
 #pragma once
 
 #include <cstdint>
@@ -27,10 +27,10 @@ namespace tavrel {
 
 class FileCrashReporting final : public CrashReporting {
  public:
-  /// Days of which structured records are kept, whatever their dates: a clock that goes wrong must
-  /// not make all of them old. Beyond these, days after tomorrow go first, then the oldest.
+  /// The number of days whose structured records are kept, whatever their dates: a wrong clock must
+  /// not make all of them old. Beyond that, days after tomorrow go first, then the oldest.
   static constexpr std::size_t kDaysKept = 31;
-  /// Rolled support logs that are kept.
+  /// The number of rolled support logs that are kept.
   static constexpr int kSupportLogsKept = 5;
 
   FileCrashReporting(const DeviceRoot& root, FileSystem& files, LinuxSystemVersion& systemVersion,
@@ -50,13 +50,13 @@ class FileCrashReporting final : public CrashReporting {
   /// The files that the clean-up removes, without their folder.
   std::vector<std::string> oldRecordFiles();
 
-  /// Whether there is a support log that is not empty, and so would roll.
+  /// Whether there is a support log to roll, one that is not empty.
   bool hasSupportLog();
 
   /// A UUID derived from the machine's identifier, which itself never leaves the device. The same
   /// for each call; "unknown" on a machine without an identifier.
   std::string systemIdentifier() override;
-  /// The name that the firmware gives; "unknown" without one.
+  /// The model name from the firmware; "unknown" without one.
   std::string hardwareModel() override;
   std::string osVersion() override;
   std::string incidentIdentifier() override;
@@ -64,7 +64,7 @@ class FileCrashReporting final : public CrashReporting {
  private:
   struct RecordFile {
     std::int64_t day;
-    std::optional<AppendedFile> file;  // nothing when it cannot be used
+    std::optional<AppendedFile> file;  // nothing when unusable
     bool isRefusalTold = false;
   };
 

@@ -4,16 +4,16 @@
 // .../Submission/outbox/, which an uploader empties. A log is "<name>-<stamp>-<unique>.log"; its
 // metadata is a property list beside it, "<name>-<stamp>-<unique>.metadata.plist".
 //
-// Only what the owner permits gets there (submission_permission.h). A log of statistics that he
-// does not permit is not filed. Any other one goes to .../Submission/withheld/, which nothing sends
-// and only root reads, and of which the newest eight stay.
+// Only logs that the owner permits get there (submission_permission.h). Other logs of statistics
+// are not filed at all. The rest go to .../Submission/withheld/, which is never sent, which only
+// root reads, and which keeps the newest eight.
 //
-// Whoever puts a log in place, moves it on or deletes what waits locks the folder Submission, and
-// then asks storage for the permission: after a withdrawal nothing is filed or sent on.
+// A process that files, moves or deletes waiting logs locks the folder Submission and then reads
+// the permission from storage: after a withdrawal nothing is filed or sent on.
 //
 // The metadata appears before the log and disappears after it, so each visible log has its
-// metadata. Metadata without a log comes from a killed process, means nothing, and is removed once
-// it is older than `limits::kTemporaryFileSeconds`.
+// metadata. Metadata without a log is left by a killed process. It means nothing, and is removed
+// once it is older than `limits::kTemporaryFileSeconds`.
 #pragma once
 
 #include <string>
@@ -58,19 +58,21 @@ class FileSubmission final : public SubmissionService {
   struct Services {
     FileSystem& files;
     PropertyListCoding& propertyLists;
-    Preferences& preferences;          // of the run
+    Preferences& preferences;          // as the run sees them
     FilePreferences& filePreferences;  // as storage has them
-    ReportedDays& reportedDays;        // the store of which daily logs are made
+    ReportedDays& reportedDays;        // the store that daily logs report
     LinuxSystemVersion& systemVersion;
     Clock& clock;
     SystemLog& log;
   };
-  /// All services must outlive it. `changesNothing`: what waits without permission stays.
+  /// All services must outlive it. With `changesNothing`, logs that wait without permission are
+  /// kept.
   FileSubmission(const DeviceRoot& root, const Services& services, bool changesNothing = false);
 
-  /// Whether statistics of yesterday may leave; an info line says why not, if the owner has allowed
-  /// later days. A run asks before it makes its log. When the owner allows nothing, this deletes
-  /// what still waits, as `removeWaiting` does, and a first day that is left over.
+  /// Whether yesterday's statistics may leave; if the owner has allowed only later days, an info
+  /// line says so. A run asks before it makes its log. When the owner allows nothing, this deletes
+  /// all waiting logs, as `removeWaiting` does, and a first day left over from an earlier
+  /// permission.
   bool isDiagnosticSubmissionEnabled() override;
   bool hasInternalDiagnostics(std::string_view identifier) override;
   bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
@@ -80,24 +82,25 @@ class FileSubmission final : public SubmissionService {
   /// Without permission nothing is sent on; an info line says so.
   void submitDiagnosticLogs() override;
 
-  /// Where a log that is made now, of the rows read last, would go; an error when nowhere.
+  /// Where a log made now, from the rows read last, would go; an error when it would not be filed.
   Expected<Place> placeOfNewLog();
 
   /// Whether `submitDiagnosticLogs` sends anything on.
   bool maySendOn() const { return static_cast<bool>(checkPermission()); }
-  /// What a run without permission deletes: 0 while storage has one or cannot be read.
+  /// How many logs a run without permission would delete; 0 while storage has one or cannot be
+  /// read.
   std::size_t countOfWaiting() const;
 
   /// Deletes the logs that wait in pending and outbox.
   RemovedLogs removeWaiting();
-  /// Deletes the logs of all folders, also what is withheld and what a server has refused.
+  /// Deletes the logs of all folders, including withheld logs and those that a server has refused.
   RemovedLogs removeAll();
 
-  /// The logs of one place in the order of their names, which `parseLogFileName` reads; no file is
-  /// opened and `metadata` is empty.
+  /// The logs of one place, sorted by name (see `parseLogFileName`). Opens no file; `metadata` is
+  /// empty.
   Expected<std::vector<FiledLog>> files(Place place);
   void readMetadata(FiledLog& log);
-  /// How many there are.
+  /// The number of logs in a place.
   Expected<std::size_t> count(Place place) const;
 
   /// The logs of one place with their metadata, oldest first. Opens the metadata of each.
@@ -106,7 +109,7 @@ class FileSubmission final : public SubmissionService {
  private:
   struct Destination {
     Place place;
-    std::int64_t day;  // that the permission must cover
+    std::int64_t day;  // which the permission must cover
   };
   struct Files {
     std::size_t logs = 0;
@@ -119,7 +122,7 @@ class FileSubmission final : public SubmissionService {
   Expected<Destination> destinationOfNewLog();
   Status fileLog(std::string_view logType, std::string_view logName,
                  const plist::Dictionary& options, const LogWriter& writer);
-  /// Puts a written log in place, if it may still go there.
+  /// Puts a written log in place, if the permission still covers it.
   Status commit(NewFile& file, const Destination& destination, const std::string& name,
                 const std::string& metadata);
   Status moveToOutbox(const std::string& name);

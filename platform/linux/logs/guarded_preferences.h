@@ -1,4 +1,4 @@
-// Preferences as a run gets them: what a tasking contains cannot change what the owner allows.
+// The preferences that a run sees: the content of a tasking cannot change the owner's permission.
 //
 // 'tavrelctl', which the owner uses, writes preferences without this guard.
 #pragma once
@@ -20,7 +20,7 @@ class GuardedPreferences final : public Preferences {
   plist::Value ZTXPreferencesGetValue(std::string_view key, std::string_view domain) override {
     return preferences_.ZTXPreferencesGetValue(key, domain);
   }
-  /// A change of the permission is dropped with a line.
+  /// Drops a change of the permission, with a log line.
   void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                               std::string_view domain) override {
     const bool isPermission = domain == kDiagnosticsDomain &&

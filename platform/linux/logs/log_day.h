@@ -1,4 +1,4 @@
-// The day whose statistics a log of statistics reports. Its metadata does not hold it.
+// The day that a log of statistics reports, which its metadata does not contain.
 #pragma once
 
 #include <cstdint>
@@ -10,10 +10,10 @@
 
 namespace tavrel {
 
-/// Of a log that has been read; nothing for one of another kind.
+/// The day of a decoded log; nothing for logs of another kind.
 std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log);
 
-/// Of a log's bytes; nothing too for what is no property list.
+/// The day of an encoded log; nothing also for bytes that are no property list.
 std::optional<std::int32_t> dayOfLog(std::string_view bytes, PropertyListCoding& propertyLists);
 
 }  // namespace tavrel

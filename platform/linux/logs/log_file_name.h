@@ -1,6 +1,6 @@
-// Files of submitted logs: "<name>-<stamp>-<unique>", followed by ".log" or ".metadata.plist".
+// Names of submitted logs' files: "<name>-<stamp>-<unique>" and ".log" or ".metadata.plist".
 //
-// So a log's name and the second in which it was filed are known without its metadata.
+// They show a log's name and the second in which it was filed without its metadata.
 #pragma once
 
 #include <cstdint>
@@ -12,10 +12,10 @@
 
 namespace tavrel {
 
-/// A log's name as the beginning of a file's name.
+/// A log's name in the form in which a file name begins.
 std::string plainLogName(std::string_view logName);
 
-/// A name, without ending, for a log that is filed now. Each call gives another.
+/// A file name, without ending, for a log filed now. Each call returns a new one.
 std::string newLogFileName(std::string_view logName, plist::Date now);
 
 struct LogFileName {
@@ -26,7 +26,7 @@ struct LogFileName {
   bool operator==(const LogFileName&) const = default;
 };
 
-/// Reads a name without ending, which the result borrows. Nothing for names of another form.
+/// Parses a name without ending; the result borrows from it. Nothing for names of another form.
 std::optional<LogFileName> parseLogFileName(std::string_view name);
 
 }  // namespace tavrel

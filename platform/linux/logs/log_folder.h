@@ -15,24 +15,24 @@ namespace tavrel {
 
 inline constexpr std::string_view kLogEnding = ".log";
 
-/// The end of the name of a log's metadata, which begins as the log's.
+/// The ending of a log's metadata file, whose name otherwise equals the log's.
 inline constexpr std::string_view kLogMetadataEnding = ".metadata.plist";
 
-/// `file` without `ending`; empty when it has another.
+/// `file` without `ending`; empty when it ends otherwise.
 std::string withoutEnding(const std::string& file, std::string_view ending);
 
 struct RemovedLogs {
-  std::size_t logs = 0;  // those in two folders under one name count once
+  std::size_t logs = 0;  // the same name in two folders counts once
   std::optional<Error> failure;
 };
 
-/// Deletes all logs of the folders, what is left of others, and what is being written. Links are
-/// deleted, not what they name. Each log goes before its metadata. A log that cannot be deleted
-/// does not keep others; the first failure is reported.
+/// Deletes all logs in the folders, leftover metadata and files still being written. Links are
+/// deleted, not their targets. Each log goes before its metadata. A log that cannot be deleted does
+/// not save others; the first failure is reported.
 RemovedLogs removeLogsIn(FileSystem& files, const std::vector<std::string>& folders);
 
-/// Deletes all but the newest `count` logs of a folder, by the stamps in their names. The one named
-/// `fresh` counts as the newest, whatever the clock said.
+/// Deletes all but the newest `count` logs of a folder, by the stamps in their names. The log named
+/// `fresh` counts as the newest, whatever its stamp says.
 void keepNewestLogs(FileSystem& files, const std::string& folder, std::size_t count,
                     const std::string& fresh);
 

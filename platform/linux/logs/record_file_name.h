@@ -1,4 +1,4 @@
-// Files of structured records: one for each type and UTC day, "<type>-<day>.jsonl".
+// Names of structured records' files, one per type and UTC day: "<type>-<day>.jsonl".
 //
 // Each line is one record: {"time":"2026-11-27T18:02:18.250Z","type":172,"record":{...}}.
 #pragma once

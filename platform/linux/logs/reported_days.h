@@ -1,5 +1,5 @@
-// A statistics store that remembers from which day on its rows were read. So whoever files a log
-// made of them knows how old its statistics are, whatever the run says.
+// A statistics store that remembers the earliest day whose rows were read. So code that files a log
+// made from them knows how old its statistics are, whatever the run claims.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +14,7 @@ namespace tavrel {
 
 class ReportedDays final : public StatisticsStore {
  public:
-  /// The store must outlive it, and it must outlive the histories that it gives.
+  /// The store must outlive it, and it must outlive the histories that it returns.
   explicit ReportedDays(StatisticsStore& store) : store_(store) {}
 
   /// The earliest day whose rows may have been read since the last call; nothing when none were.

@@ -3,8 +3,8 @@
 // Two preferences of the domain `kDiagnosticsDomain` hold it: a switch, and the first day whose
 // statistics may leave. 'tavrelctl allow' sets both, so that nothing that was recorded before the
 // owner agreed leaves the device. A switch that others set without a day counts at once. So a day
-// that is left over from an earlier permission can hold a later one back, but never let it count
-// earlier than a switch alone would.
+// left over from an earlier permission can delay a later one, but never make it count earlier than
+// the switch alone would.
 #pragma once
 
 #include <cstdint>
@@ -21,24 +21,24 @@ class FilePreferences;
 class Preferences;
 
 struct SubmissionPermission {
-  /// A first day that is none: it holds everything back.
+  /// A first day that never comes: it withholds everything.
   static constexpr std::int32_t kNoDay = std::numeric_limits<std::int32_t>::max();
 
   bool isGiven = false;                  // the switch
   std::optional<std::int32_t> firstDay;  // nothing: any day
 
-  /// Whether a log of `day` may leave the device: the day of its statistics, or the one on which a
-  /// log without statistics was made.
+  /// Whether a log of `day` may leave the device. The day is that of its statistics or, for a log
+  /// without statistics, the one on which it was made.
   bool covers(std::int64_t day) const { return isGiven && (!firstDay || day >= *firstDay); }
 
   bool operator==(const SubmissionPermission&) const = default;
 };
 
-/// As this process sees it: not given when preferences cannot be read. A first day that is no
-/// integer of 32 bits counts as `kNoDay`.
+/// The permission as this process sees it: not given when preferences cannot be read. A first day
+/// that is not a 32-bit integer counts as `kNoDay`.
 SubmissionPermission submissionPermission(Preferences& preferences);
 
-/// As storage has it at this moment; an error when it cannot be read.
+/// The permission as storage has it at this moment; an error when it cannot be read.
 Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& preferences);
 
 /// Sets both preferences; the caller synchronises the domain.

@@ -1,14 +1,14 @@
 // Preferences as property lists, one file per domain:
 // /var/mobile/Library/Preferences/<domain>.plist.
 //
-// A domain is read on first use. What this process sets shows at once, but stays a separate list of
-// changes until the domain is synchronised. Under a lock that all writers share, the changes are
-// then applied to the file as it is at that moment, so that keys that others have written in the
-// meantime survive. A domain without changes costs no write. Destruction synchronises all changed
-// domains.
+// A domain is read on first use. Values that this process sets are visible to it at once, but stay
+// a separate list of changes until the domain is synchronised. The changes are then applied, under
+// a lock that all writers share, to the current content of the file, so keys that others have
+// written in the meantime survive. A domain without changes costs no write. The destructor
+// synchronises all changed domains.
 //
 // A change that no property list can hold, that needs more than 1 MiB or that no longer fits into
-// the file is dropped with a line, so that the other changes of its domain are written.
+// the file is dropped with a log line, so that the domain's other changes are written.
 //
 // A file that is not a property list is reported once, reads as empty, and is set aside as
 // "<domain>.plist.corrupt-<stamp>" when the domain is next written.
@@ -49,7 +49,7 @@ class FilePreferences final : public Preferences {
   plist::Dictionary values(std::string_view domain);
 
   /// A domain as its file has it at this moment, without this process's changes; an empty handle
-  /// when there is no file. Unlike the look-ups it fails when the file cannot be read.
+  /// when there is no file. Unlike look-ups, this fails when the file cannot be read.
   Expected<plist::Dictionary> storedValues(std::string_view domain);
 
   /// Whether `domain` can name a file: not empty, at most `limits::kPreferenceDomainBytes` bytes,
@@ -67,7 +67,7 @@ class FilePreferences final : public Preferences {
   struct Content {
     std::string bytes;         // empty when there is no file
     plist::Dictionary values;  // may be an empty handle
-    std::string fault;         // why the bytes are not preferences; empty when they are
+    std::string fault;         // why the bytes are no preferences; empty when they are
   };
 
   Domain& domainNamed(std::string_view domain);
@@ -77,7 +77,7 @@ class FilePreferences final : public Preferences {
   bool synchronize(Domain& domain, std::string_view name);
   Status writeChanges(Domain& domain, std::string_view name);
   /// `merged`, which is `stored` with the domain's changes, as XML. Changes that no file can hold
-  /// or that do not fit into this one are dropped from both, with a line each.
+  /// or that do not fit into this one are dropped from both, with a log line each.
   Expected<std::string> encodeWhatFits(Domain& domain, const plist::Dictionary& stored,
                                        plist::Dictionary& merged, std::string_view name);
   Status setAside(const std::string& path, std::string_view fault);

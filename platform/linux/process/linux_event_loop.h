@@ -1,7 +1,7 @@
 // The main event loop over epoll.
 //
-// A source is a descriptor and a callback; a slice calls at most one callback that had something to
-// do. Callbacks run inside `runSlice`, one at a time, and may add and remove sources, their own
+// A source is a descriptor and a callback; a slice ends after the first callback that reports an
+// event. Callbacks run inside `runSlice`, one at a time, and may add and remove sources, their own
 // included. SIGTERM and SIGINT are held back from the first slice until the loop is destroyed, so
 // that they end the wait between two events and never in the middle of one.
 //
@@ -10,7 +10,7 @@
 //   while (loop.runSlice(10s) == EventLoop::Slice::HandledEvent) {}
 //
 // Durations follow the monotonic clock: neither a signal nor a change of the clock shortens a
-// slice, and time that the machine sleeps does not count.
+// slice, and time during which the machine sleeps does not count.
 #pragma once
 
 #include <csignal>
@@ -28,7 +28,7 @@ namespace tavrel {
 
 class LinuxEventLoop final : public EventLoop {
  public:
-  /// What a callback did. `Nothing` makes the slice wait for its remaining time.
+  /// What a callback handled. After `Nothing` the slice waits for its remaining time.
   enum class Activity { Event, Nothing };
   using Callback = std::function<Activity()>;
 
@@ -60,10 +60,10 @@ class LinuxEventLoop final : public EventLoop {
   LinuxEventLoop& operator=(const LinuxEventLoop&) = delete;
   ~LinuxEventLoop() override;
 
-  /// Calls `callback` whenever `descriptor` is readable or its other end has gone.
+  /// Calls `callback` whenever `descriptor` is readable or its other end has closed.
   Expected<Source> watch(int descriptor, Callback callback);
 
-  /// Once it has returned `Terminated`, it always does.
+  /// Once it has returned `Terminated`, every later call does too.
   Slice runSlice(std::chrono::milliseconds longest) override;
 
  private:

@@ -1,4 +1,4 @@
-// The channels that a recorded hub knows, with the elements that each shows in each update.
+// The channels that a recorded hub knows, with their elements for each update.
 #pragma once
 
 #include <cstddef>
@@ -19,8 +19,8 @@ class HubChannel {
  public:
   explicit HubChannel(plist::Value elements);
 
-  /// The group that update number `update` shows, from 0; empty where the channel was absent. The
-  /// last one stays.
+  /// The group that update number `update` shows, from 0; empty where the channel was absent. Later
+  /// updates repeat the last one.
   ByteSpan group(std::size_t update) const;
   std::size_t largestGroup() const { return largest_; }
 
@@ -32,7 +32,7 @@ class HubChannel {
 class HubChannels {
  public:
   /// Adds the "Channels" of a recording. A channel that is already known, or whose elements do not
-  /// form whole groups of its own, is left out with a line.
+  /// form whole groups of its own, is left out with a log line.
   void add(const plist::Array& channels, std::string_view origin, RefusalLog& refusals);
 
   /// Null when the hub does not know the channel.
@@ -45,7 +45,7 @@ class HubChannels {
     bool operator==(const Key&) const = default;
   };
   struct KeyHash {
-    // The author of a recording chooses the ids.
+    // Keyed, because the author of a recording chooses the IDs.
     std::size_t operator()(const Key& key) const {
       return keyedHash(asText(std::as_bytes(std::span(&key, 1))));
     }

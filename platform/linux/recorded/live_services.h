@@ -1,4 +1,4 @@
-// Services whose channels are not recorded but read when the hub is asked to update.
+// Services whose channels are not recorded but read at each update of the hub.
 #pragma once
 
 #include <cstddef>
@@ -15,12 +15,13 @@ class LiveSampling {
  public:
   virtual ~LiveSampling() = default;
 
-  /// Takes a channel in. The size of its group of elements; 0 when no live service has it.
+  /// Adds a channel. Returns the size in bytes of its group of elements; 0 when no live service has
+  /// it.
   virtual std::size_t add(std::uint64_t driverID, std::uint64_t channelID) = 0;
   /// Reads all channels again.
   virtual void update() = 0;
-  /// Writes the group of channel `index`, by the order of adding, at the beginning of `room`, which
-  /// has at least its size. The bytes written; 0 while the channel has no value.
+  /// Writes the group of channel `index`, in the order of adding, to the beginning of `room`, which
+  /// is large enough. Returns the bytes written; 0 while the channel has no value.
   virtual std::size_t write(std::size_t index, MutableByteSpan room) const = 0;
 };
 
@@ -28,7 +29,7 @@ class LiveServices {
  public:
   virtual ~LiveServices() = default;
 
-  /// The services in the form that a recording has. They are found out once.
+  /// The services in the form of a recording. They are discovered once.
   virtual plist::Array services() = 0;
   virtual std::unique_ptr<LiveSampling> subscribe() = 0;
 };

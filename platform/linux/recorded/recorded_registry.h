@@ -3,8 +3,8 @@
 // Linux has no such registry. Property lists in /var/lib/tavrel/registry under the device root
 // record what a device's drivers publish and answer. docs/registry.md describes the format.
 //
-// A walk goes over the services as they were when it began. It becomes invalid when the generation
-// of the recordings changes.
+// A walk covers the services that existed when it began. It becomes invalid when the generation of
+// the recordings changes.
 #pragma once
 
 #include <memory>
@@ -26,9 +26,8 @@ class RecordedRegistry final : public DriverRegistry {
   /// Shows live services, where given, beside the recorded ones; they must outlive it.
   RecordedRegistry(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
                    SystemLog& log, LiveServices* live = nullptr);
-  /// Plays one recording, in the form that a file of the folder has. The dictionary is shared, so
-  /// its changes show; those of its services and channels show once its "Generation" has changed
-  /// too.
+  /// Plays one recording, a dictionary in the form of a recording file. The dictionary is shared,
+  /// so its changes show; those of its services and channels once its "Generation" has changed too.
   RecordedRegistry(const plist::Dictionary& recording, SystemLog& log);
   ~RecordedRegistry() override;
 
@@ -36,10 +35,10 @@ class RecordedRegistry final : public DriverRegistry {
   KernelReturn matchingServices(const plist::Dictionary& matching,
                                 std::unique_ptr<ServiceIterator>& services) override;
 
-  /// Everything recorded that the registry shows now, as one recording that plays back the same.
+  /// All recorded content that the registry shows now, as one recording that plays back the same.
   plist::Dictionary recording();
 
-  /// The live services that are shown, as a recording has them.
+  /// The live services that are shown, in the form of a recording.
   plist::Array liveServices();
 
  private:

@@ -28,7 +28,7 @@ struct RecordingPart {
   plist::Dictionary content;
 };
 
-/// Entry id of the hub that is there for live services when no recording has one.
+/// Entry ID of the hub made for live services when no recording has a hub.
 inline constexpr std::int64_t kLiveHubID = 0x4c69'7665'4875'62;
 
 struct RecordedEntry {
@@ -42,12 +42,12 @@ struct RecordedEntry {
 
 class Recording {
  public:
-  /// The live services, where there are any, come behind the recorded ones. A recorded service with
-  /// class and name of a live one takes its place. They must outlive the recording.
+  /// Live services, if any, follow the recorded ones; they must outlive the recording. A recorded
+  /// service with the class and name of a live one replaces it.
   Recording(std::span<const RecordingPart> parts, LiveServices* live, SystemLog& log);
 
   const std::vector<RecordedEntry>& services() const { return services_; }
-  /// Positions in `services`, in their order.
+  /// Indices into `services`, ascending.
   std::span<const std::size_t> servicesOfClass(std::string_view className) const;
   /// The first service with that entry id; null when there is none.
   const RecordedEntry* serviceWithID(std::uint64_t entryID) const;

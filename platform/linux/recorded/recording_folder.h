@@ -25,7 +25,7 @@ class RecordingFolder {
       : root_(root), files_(files), propertyLists_(propertyLists), log_(log) {}
 
   /// Updates `parts` from the "*.plist" files of the folder, in the order of their names. Reads
-  /// only files that were replaced or changed. Yields whether there were any.
+  /// only files that were replaced or changed. Returns whether there were any.
   bool update(std::vector<RecordingPart>& parts);
 
  private:
@@ -47,7 +47,7 @@ class RecordingFolder {
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
   std::vector<Stamp> stamps_;  // one for each part
-  std::string complaint_;      // the last one, so that updates do not repeat it
+  std::string complaint_;      // the last one logged, so that updates do not repeat it
 };
 
 }  // namespace tavrel

@@ -1,8 +1,8 @@
 // A connection to the recorded reporting hub, the service of class "IOReportHub".
 //
-//   method 0: opens the hub for this connection; the others are refused before
-//   method 2: takes the channels of interest, makes a buffer for their elements and answers its id
-//   method 3: with a buffer's id, brings the elements in that buffer up to date
+//   method 0: opens the hub for this connection; other methods are refused until then
+//   method 2: takes the channels of interest, makes a buffer for their elements and returns its ID
+//   method 3: takes a buffer's ID and updates the elements in that buffer
 //
 // platform/report_protocol.h has the protocol.
 //
@@ -12,9 +12,9 @@
 // interest; channels that it does not know, and live ones without a value, are left out. The first
 // update shows the first group of each channel's sequence, the next one the second, and so on for
 // each buffer on its own. Groups of one channel may differ in length, so the buffer has room for
-// the longest. Groups that belong to no channel (driver 0, id 2^63) cover the free space after the
-// last group, so that a reader that goes from group to group always reaches the end. Before the
-// first update the buffer is zero.
+// the longest. Groups that belong to no channel (driver 0, ID 2^63) fill the space after the last
+// group, so a reader that steps from group to group always reaches the end. Before the first update
+// the buffer is zero.
 #pragma once
 
 #include <memory>

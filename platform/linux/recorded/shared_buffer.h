@@ -1,4 +1,4 @@
-// Memory that a driver of this process shares with its client: an anonymous memory file that one
+// Memory that a driver in this process shares with its client: an anonymous memory file that one
 // side writes and the other maps for reading.
 #pragma once
 
@@ -13,7 +13,7 @@
 
 namespace tavrel {
 
-/// A mapped range of memory, unmapped with its owner.
+/// A mapped range of memory, unmapped on destruction.
 class MemoryRange {
  public:
   MemoryRange() = default;

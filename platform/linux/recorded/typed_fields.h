@@ -1,4 +1,4 @@
-// Fields of recordings.
+// Typed access to the fields of recordings.
 #pragma once
 
 #include <cstdint>
@@ -36,7 +36,7 @@ struct RecordedField {
   Form form;
 };
 
-/// The required type in words when the value has another one; null otherwise.
+/// The required type in words when the entry's value has another; null otherwise.
 const char* missedForm(std::span<const RecordedField> fields, const plist::Entry& entry);
 
 /// What is wrong with the fields of a record, as the end of a message; empty when nothing is.

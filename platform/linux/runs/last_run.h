@@ -4,7 +4,7 @@
 //     Time (date, when it began), Task ("daily", "forced", "today" or "service"), Day (integer,
 //     absent when no day's tasks began), Finished (boolean), Ended (date), LastFinished (date, kept
 //     over runs that did not finish), Errors (array of strings, the first ones), ErrorCount
-//     (integer), and Process, Started, Boot, which tell whether it is still running
+//     (integer), and Process, Started, Boot, which identify the process
 //
 // docs/status.md describes it.
 #pragma once
@@ -25,7 +25,7 @@ namespace tavrel {
 
 inline constexpr std::string_view kLastRunFile = "/var/lib/tavrel/last-run.plist";
 
-/// A process of this machine, told apart from all others, earlier boots included.
+/// Identifies a process of this machine among all others, including those of earlier boots.
 struct ProcessIdentity {
   std::int64_t process = 0;
   std::int64_t started = 0;  // ticks since boot

@@ -1,4 +1,4 @@
-// A log that remembers, for who asks later, which day's tasks a run did and what it could not do.
+// A log that records which day's tasks a run did and what failed, for later queries.
 //
 //   RunMemory memory(root, clock, systemLog, "daily");
 //   {
@@ -28,11 +28,11 @@ class RunMemory final : public SystemLog {
   /// Clock and log must outlive it.
   RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::string_view task);
 
-  /// Passes the entry on. Errors are kept; the line with which the tasks of a day begin writes the
-  /// record.
+  /// Passes the entry on. Keeps errors, and writes the record at the line with which a day's tasks
+  /// begin.
   void write(LogLevel level, std::string_view message) override;
 
-  /// The run has come to its end, whatever it could not do.
+  /// Records that the run has reached its end, with or without errors.
   void finish();
 
  private:
@@ -44,7 +44,7 @@ class RunMemory final : public SystemLog {
   SystemLog& log_;
   FileSystem files_;
   LastRun run_;
-  bool isEarlierKnown_ = false;  // what the record of the earlier run has that this one keeps
+  bool isEarlierKnown_ = false;  // the data to keep from the earlier run's record
 };
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The parts of a segment's file that are read without interpretation: bytes, header, names of keys.
+// Low-level access to a segment's file: bytes, header, names of keys.
 #pragma once
 
 #include <array>
@@ -21,7 +21,7 @@ struct SegmentFacts {
 };
 
 /// Bytes beyond the end, for example of a truncated file, read as zero. So do those that cannot be
-/// read; `error` tells.
+/// read; see `error`.
 class SegmentFile {
  public:
   /// Borrows the descriptor.
@@ -33,7 +33,7 @@ class SegmentFile {
 
   SegmentFacts facts() const;
 
-  /// The number of the last failure to read, 0 when there was none.
+  /// The error number of the last failed read, 0 when none failed.
   int error() const { return error_; }
 
   /// The name of the key with this number; null when there is no valid one of this kind. It stays
@@ -49,7 +49,7 @@ class SegmentFile {
 
   int descriptor_;
   mutable int error_ = 0;
-  // By number, once one was asked for. Kinds are apart from the names, to stay near the processor.
+  // By number; filled at the first request. Kinds are kept apart from names, to stay in the cache.
   std::vector<std::uint8_t> kinds_;
   std::vector<std::string> names_;
 };

@@ -1,8 +1,8 @@
-// How far a segment has been folded: what a store remembers with the values that it took, so that
+// How far a segment has been folded. A store remembers this with the values that it took, so that
 // each is taken once.
 //
-// The bytes of a position hold only what was folded of the segment, 20 bytes per cell and 12 per
-// chunk: what its header claims or a reader refuses takes nothing. A fold bounds the bytes of each
+// An encoded position holds only what was folded of the segment, 20 bytes per cell and 12 per
+// chunk; claims of its header and refused values take no space. A fold bounds the bytes of each
 // user's positions. A segment that was folded to its end, and to which nobody can write, needs no
 // more than a mark.
 #pragma once
@@ -17,7 +17,7 @@
 namespace tavrel {
 
 struct SegmentPosition {
-  /// A scalar's cell: what of it has been folded.
+  /// The folded part of a scalar's cell.
   struct Cell {
     std::uint64_t sets = 0;
     std::int64_t value = 0;
@@ -32,9 +32,9 @@ struct SegmentPosition {
 
   std::vector<Cell> cells;
   std::vector<Chunk> chunks;
-  std::uint64_t dropped = 0;  // values that the program lost, as far as they have been reported
-  bool isEnd = false;         // nothing is left to fold, and never will be; the rest is empty
-  bool isKnown = false;       // whether a read or a store has told it
+  std::uint64_t dropped = 0;  // values that the program lost and that have been reported
+  bool isEnd = false;         // nothing is left to fold or ever will be; the rest is empty
+  bool isKnown = false;       // whether a read or a store has set it
 
   static SegmentPosition end() {
     return {.cells = {}, .chunks = {}, .isEnd = true, .isKnown = true};
@@ -42,7 +42,7 @@ struct SegmentPosition {
   bool operator==(const SegmentPosition&) const = default;
 
   std::string encode() const;
-  /// The bytes of a position with so many parts.
+  /// The size in bytes of a position with that many parts.
   static std::size_t bytesOf(std::size_t cells, std::size_t chunks);
   /// Without unused parts at the ends. Refuses bytes that `encode` did not write.
   static Expected<SegmentPosition> decode(std::string_view bytes);

@@ -31,7 +31,8 @@ struct SegmentScalar {
   std::int32_t day;      // UTC, days since 1970-01-01
   bool isSet;            // replaces the value; otherwise it is added
   std::int64_t value;
-  /// UTC of a set, in nanoseconds since 1970, saturated: of sets by two processes the later counts.
+  /// UTC of a set, in nanoseconds since 1970, saturated: when two processes set a scalar, the later
+  /// set counts.
   std::int64_t setTime;
 };
 
@@ -51,14 +52,14 @@ class SegmentSink {
   virtual void takeRecord(const SegmentRecord& record) = 0;
 };
 
-/// The UTC instant of the boot in seconds since 1970; nothing while the clock is not credible, and
+/// The UTC instant of the boot in seconds since 1970; nothing while the clock is not credible;
 /// values without a date then wait.
 using BootInstant = std::optional<std::int64_t>;
 
-/// The same by this machine's clocks. A clock that shows a day before the build is wrong.
+/// The same by this machine's clocks. Not credible: a clock that shows a day before the build.
 BootInstant currentBootInstant();
 
-/// What a read did besides yielding values.
+/// The results of a read, apart from the values.
 struct SegmentProgress {
   struct Acknowledgement {
     std::uint64_t offset;
@@ -68,14 +69,14 @@ struct SegmentProgress {
   std::uint64_t nextFolds = 0;
   std::uint64_t dropped = 0;  // values that the program lost since the position
   std::uint64_t refused = 0;  // values of invalid keys or days, skipped for good
-  bool isComplete = true;     // nothing was left for later without a date or while it changed
+  bool isComplete = true;     // false: values without a date, or that changed, wait
 };
 
 class SegmentReader {
  public:
   enum class State : std::uint8_t {
     Begun,
-    Empty,  // its process has not written the header yet, or died before it could
+    Empty,  // its process has not written the header yet, or died first
   };
 
   /// Borrows a descriptor that can be read.
@@ -83,17 +84,19 @@ class SegmentReader {
 
   /// An error for a file that is not a segment of this version: foreign type, size or magic.
   Expected<State> state() const;
-  /// All there when they are read after `state` has said that the segment is begun.
+  /// Complete when called after `state` has returned `Begun`.
   SegmentFacts facts() const { return file_.facts(); }
 
-  /// Fails when something that was looked at so far could not be read: it is not to be used then.
+  /// Fails when some read so far has failed: the results must not be used then.
   Status readable() const;
 
-  /// The most bytes that a position has after a read of what the header says is used.
+  /// The largest size in bytes of a position after a read, by the used parts that the header
+  /// claims.
   std::size_t positionBytes() const;
 
-  /// Yields what came after `position`, and advances it. `writerIsGone` says what was known before
-  /// the call (see `segment_writer.h`): if true, records after an unfinished one are read too.
+  /// Passes the values after `position` to `sink`, and advances it. `writerIsGone` (see
+  /// `segment_writer.h`) must have been true before the call: then records after an unfinished one
+  /// are read too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                        SegmentSink& sink);
 
@@ -116,7 +119,7 @@ class SegmentReader {
 };
 
 /// Lets the process reuse the space that `progress` passed. Call it once the values and the
-/// position are durable. A failure is harmless: the next fold repeats it.
+/// position are durable. A failure is harmless: the next fold acknowledges again.
 Status acknowledge(int writableDescriptor, const SegmentProgress& progress);
 
 }  // namespace tavrel

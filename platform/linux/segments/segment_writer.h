@@ -7,12 +7,12 @@ namespace tavrel {
 
 enum class SegmentWriter : unsigned char {
   Gone,     // for good: only the process that creates a segment opens it for writing
-  Present,  // or this process has a descriptor open for writing
-  Unknown,  // leave the segment
+  Present,  // also when this process has it open for writing
+  Unknown,  // keep the segment
 };
 
 /// Asks the kernel for a lease, which it refuses while any process has the file open or mapped for
-/// writing. Needs the file's owner or CAP_LEASE, and a read-only descriptor. Where leases do not
+/// writing. Needs the file's owner or CAP_LEASE, and a read-only descriptor. When leases do not
 /// work, looks for the process that `facts` names.
 SegmentWriter findSegmentWriter(int readOnlyDescriptor, const SegmentFacts& facts);
 

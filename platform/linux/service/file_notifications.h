@@ -6,9 +6,9 @@
 //
 //   inotifywait -e moved_to /run/tavrel/notifications
 //
-// Posters take turns by locking ".lock" in the folder. The next post replaces a counter that cannot
-// be read, with a line, and goes on from the microseconds since 1970, a number that no waiting
-// process has seen.
+// Posters take turns by locking ".lock" in the folder. When a counter cannot be parsed, the next
+// post logs that and replaces it with the microseconds since 1970, a number that no waiting process
+// has seen.
 #pragma once
 
 #include <chrono>
@@ -36,7 +36,7 @@ class FileNotifications final : public Notifications {
   /// How often `name` was posted; 0 when never.
   Expected<std::uint64_t> count(std::string_view name) const;
 
-  /// Waits until the count differs from `seen` and yields it, or `seen` when the time is over.
+  /// Waits until the count differs from `seen` and returns it, or `seen` when the time is up.
   Expected<std::uint64_t> waitBeyond(std::string_view name, std::uint64_t seen,
                                      std::chrono::milliseconds longest) const;
 

@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// The dictionary in the bytes of a message, or why there is none.
+/// The dictionary in a message's bytes; the error says why there is none.
 Expected<plist::Dictionary> decodeMessage(ByteSpan bytes);
 
 /// No packet has come; the next call may find one.

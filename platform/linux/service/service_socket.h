@@ -1,6 +1,6 @@
 // The sockets of named services: a sequenced-packet socket below the device root,
 // "/run/tavrel/NAME.socket". A process that makes the socket itself locks "NAME.lock" in the same
-// folder. The service manager holds no lock; whether it listens is found out without connecting.
+// folder. The service manager holds no lock; whether it listens is checked without connecting.
 #pragma once
 
 #include <string>
@@ -37,8 +37,8 @@ class SocketAddress {
   Descriptor folder_;
 };
 
-/// A listening socket that this process has made. Its file is removed with it, unless another has
-/// taken its place.
+/// A listening socket. If this process made it, its file is removed with it, unless another file
+/// has taken its place.
 class ServiceSocket {
  public:
   /// Listens at the path of the service `name`, with mode 0600. Replaces a file that a killed

@@ -1,5 +1,5 @@
-// Named services as sequenced-packet sockets. service_message.h has the messages, service_socket.h
-// the paths. A socket from the service manager takes precedence.
+// Named services as sequenced-packet sockets. See service_message.h for the messages,
+// service_socket.h for the paths. A socket from the service manager takes precedence.
 //
 //   SocketServices services(loop, root, log);
 //   auto listener = services.createListener("com.norvane.tallied.tavrel");
@@ -10,18 +10,18 @@
 // are not messages: the peer is dropped with a log line, at most `limits::kRefusalLinesPerMinute` a
 // minute.
 //
-// These count as an event, and so restart the wait for the next one:
+// The following count as events, and so restart the wait for the next one:
 //   - a message, whatever it says;
-//   - a new peer, and its end, by itself or because it was dropped. Of new peers in a row, with no
-//     message from anybody in between, only the first `limits::kSilentConnections` count; further
+//   - a new peer, and its end, whether it closed or was dropped. Of new peers in a row, with no
+//     message from anybody in between, only the first `limits::kSilentConnections` count; later
 //     ones are served, but the wait goes on;
 //   - the end of a peer that has sent a message.
 // A peer that was refused never counts.
 //
-// Beyond `limits::kServicePeers` peers new ones wait in the kernel's queue until a peer leaves;
-// when the system is short of descriptors or memory, also until the next try a second later. The
-// service writes to no peer, so a peer that does not read costs nothing; the kernel holds up one
-// that writes too fast.
+// Beyond `limits::kServicePeers` peers, new ones wait in the kernel's queue until a peer leaves;
+// when the system is short of descriptors or memory, they wait until the next try a second later or
+// until a peer leaves. The service never writes to peers, so one that does not read costs nothing;
+// the kernel blocks one that writes too fast.
 #pragma once
 
 #include <memory>
@@ -34,7 +34,7 @@
 
 namespace tavrel {
 
-/// The loop, the root and the log must outlive it, the loop and the log its listeners too.
+/// The loop, the root and the log must outlive it; the loop and the log also its listeners.
 class SocketServices final : public NamedServices {
  public:
   SocketServices(LinuxEventLoop& loop, const DeviceRoot& root, SystemLog& log)

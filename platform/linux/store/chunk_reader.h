@@ -17,7 +17,7 @@
 
 namespace tavrel {
 
-/// The operations throw a `StoreFailure` that does not name the distribution.
+/// Operations throw a `StoreFailure` that does not name the distribution.
 class ChunkReader {
  public:
   /// The connection must outlive the reader.
@@ -31,7 +31,7 @@ class ChunkReader {
   void begin(std::vector<ChunkRun> runs, std::int64_t count);
   /// The next values, valid until the next call; nothing when all have been read.
   std::optional<DistributionBlock> next(bool wantsOffsets);
-  /// Gives up what has not been read.
+  /// Abandons the rest of the values.
   void end();
 
  private:
@@ -39,15 +39,15 @@ class ChunkReader {
   class Cursor {
    public:
     explicit Cursor(const SqliteConnection& connection) : connection_(connection) {}
-    /// The data of `chunk`, valid until the next call. `last` is the one up to which chunks are
-    /// wanted one after the other. Nothing when there is no such chunk.
+    /// The data of `chunk`, valid until the next call. Chunks are expected to be asked for in turn,
+    /// up to `last`. Nothing when there is no such chunk.
     std::optional<std::string_view> at(std::int64_t chunk, std::int64_t last);
     void end();
 
    private:
     const SqliteConnection& connection_;
     std::optional<SqliteStatement> rows_;  // made when it is first needed
-    std::optional<std::int64_t> next_;     // the chunk after which the statement stands
+    std::optional<std::int64_t> next_;     // the chunk that the statement yields next
   };
 
   DistributionBlock unpack(std::string_view records);
@@ -56,8 +56,8 @@ class ChunkReader {
   Cursor values_;
   Cursor offsets_;
   std::vector<ChunkRun> runs_;
-  std::size_t run_ = 0;     // the current one of them
-  std::int64_t chunk_ = 0;  // of the current run, the next
+  std::size_t run_ = 0;     // index of the current run
+  std::int64_t chunk_ = 0;  // the next one of the current run
   std::int64_t count_ = 0;
   std::int64_t read_ = 0;
   std::string unpackedValues_;

@@ -18,14 +18,14 @@
 
 namespace tavrel {
 
-/// A row takes no values. Nothing has been changed, and other rows can still be written.
+/// A row cannot take values. Nothing has been changed, and other rows can still be written.
 struct RowFailure : StoreFailure {
   using StoreFailure::StoreFailure;
 };
 
 class DistributionWriter {
  public:
-  /// For one transaction, which must outlive the writer as the connection must.
+  /// For one transaction. It and the connection must outlive the writer.
   explicit DistributionWriter(SqliteConnection& connection);
 
   /// Throws `RowFailure` when the row is damaged or full, otherwise `StoreFailure`.
@@ -45,7 +45,7 @@ class DistributionWriter {
   SqliteStatement getRuns_;
   SqliteStatement setRuns_;
   SqliteStatement addChunk_;
-  std::int64_t nextChunk_ = -1;  // not looked up yet when negative
+  std::int64_t nextChunk_ = -1;  // negative: not looked up yet
 };
 
 }  // namespace tavrel

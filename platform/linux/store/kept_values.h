@@ -1,10 +1,8 @@
-// A file beside the store that keeps scalars that could not be committed, until a commit takes
-// them.
+// A file beside the store for scalars that could not be committed, until a commit takes them.
 //
-// A batch that begins to write takes the file's values in first, and removes the file once they are
-// committed. In the same transaction the store remembers, as its application id, which values it
-// has taken in, so that those of a file that a killed process could not remove are not taken in
-// twice.
+// A batch that begins to write takes in the file's values first, and removes the file once they are
+// committed. In the same transaction it records in the store's application ID which values it took,
+// so that they are not taken twice when a killed process could not remove the file.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +16,7 @@
 namespace tavrel {
 
 struct KeptValue {
-  std::uint32_t number;  // random; the same for all values that were kept at once
+  std::uint32_t number;  // random; the same for all values kept by one call
   std::int32_t day;
   std::int64_t value;
   std::string key;
@@ -36,12 +34,12 @@ class KeptValues {
   /// In the order in which they were kept; none when there is no file.
   Expected<KeptContent> read();
   /// Adds values durably to those of the file, and gives them their numbers. Drops the earliest
-  /// beyond `limits::kKeptValueBytes` and yields how many. Fails when the file
-  /// is damaged or cannot be read.
+  /// values beyond `limits::kKeptValueBytes` and returns their number. Fails when the file is
+  /// damaged or cannot be read.
   Expected<std::size_t> add(std::vector<KeptValue> values);
   void remove() { files_.discard(path_); }
-  /// Moves a damaged file to `PATH-damaged`, in place of the one that was moved before. Yields a
-  /// line about it, or nothing when the file is not damaged.
+  /// Moves a damaged file to `PATH-damaged`, replacing an earlier one. Returns a line about it, or
+  /// an empty string when the file is not damaged.
   std::string setAsideIfDamaged();
 
  private:

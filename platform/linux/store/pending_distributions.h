@@ -21,7 +21,7 @@
 namespace tavrel {
 
 class PendingDistributions {
-  // Values of one distribution that were recorded one after the other, their offsets behind them.
+  // Consecutive values of one distribution, followed in memory by their offsets.
   struct Piece {
     std::byte* values;
     std::uint32_t capacity;
@@ -31,7 +31,7 @@ class PendingDistributions {
   /// The values of one distribution.
   class Series {
     friend class PendingDistributions;
-    // Where the next one goes in the last piece, and how many more it takes.
+    // Where the next value goes in the last piece, and how many more fit.
     std::byte* value_ = nullptr;
     std::byte* offset_ = nullptr;
     std::uint32_t room_ = 0;
@@ -51,8 +51,8 @@ class PendingDistributions {
   }
   void append(std::int32_t day, std::string_view key, std::span<const DistributionSample> samples);
 
-  /// Passes all on, by day and then by key, the values of each in the order of `append`. The blocks
-  /// are valid during the call.
+  /// Passes all values on, by day and then by key, those of each row in the order of `append`. The
+  /// blocks are valid during the call.
   template <class Take>
   void each(Take take) const {
     std::string values;
@@ -64,17 +64,17 @@ class PendingDistributions {
       }
     }
   }
-  /// Keeps memory for what comes next.
+  /// Keeps the memory for later values.
   void clear();
 
   bool empty() const { return series_.empty(); }
-  /// Of memory.
+  /// Memory in use.
   std::size_t bytes() const { return bytes_; }
 
  private:
   struct Name {
     std::int32_t day = 0;
-    std::string_view key;  // of the series
+    std::string_view key;  // owned by the series
     bool operator==(const Name&) const = default;
   };
   struct HashName {
@@ -88,7 +88,7 @@ class PendingDistributions {
   static void gather(const Series& series, std::string& values, std::string& offsets);
 
   Map series_;
-  Entry* last_ = nullptr;  // values of one distribution often follow each other
+  Entry* last_ = nullptr;  // used last; successive values often share a distribution
   SampleMemory memory_;
   std::size_t bytes_ = 0;
 };

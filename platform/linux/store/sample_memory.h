@@ -1,7 +1,7 @@
-// Memory for many small pieces that are all given up at once.
+// Memory for many small pieces that are all released at once.
 //
-// The first touch of a page costs more than what is stored in it. The kernel therefore makes the
-// pages of a slab in one call.
+// The first touch of a page costs more than what is stored in it. Therefore the kernel is asked to
+// provide all pages of a slab in one call.
 #pragma once
 
 #include <cstddef>
@@ -16,9 +16,9 @@ class SampleMemory {
   SampleMemory(const SampleMemory&) = delete;
   SampleMemory& operator=(const SampleMemory&) = delete;
 
-  /// Aligned for numbers; `bytes` are at most 32 KiB. Valid until `reuse`. Throws `std::bad_alloc`.
+  /// Aligned for numbers; `bytes` is at most 32 KiB. Valid until `reuse`. Throws `std::bad_alloc`.
   std::byte* take(std::size_t bytes);
-  /// Gives up all pieces and keeps the slabs for the next ones.
+  /// Releases all pieces and keeps the slabs for the next ones.
   void reuse();
 
  private:

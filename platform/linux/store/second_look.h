@@ -1,4 +1,4 @@
-// Whether a store that SQLite found damaged is.
+// Checks whether a store that SQLite reports as damaged really is.
 //
 // SQLite reports a read that the device fails (EIO) as damage. Such a store must stay where it is.
 #pragma once
@@ -11,12 +11,12 @@
 
 namespace tavrel {
 
-/// Whether SQLite's check of the whole store finds it as it should be: the order of rows, too.
+/// Whether SQLite's check of the whole store finds nothing wrong, including the order of rows.
 bool isSound(SqliteConnection& connection);
 
-/// Looks again, on connections of its own; this process must have no other one that is open.
-/// Nothing when there is damage and every byte can be read, otherwise what to say of the store.
-/// Takes as long as reading all of it. `leavesNoTrace` as for `openStoreForReading`.
+/// Checks on connections of its own; this process must have no other open one. Nothing when the
+/// store is damaged and every byte can be read; otherwise the failure to report instead. Takes as
+/// long as reading the whole file. `leavesNoTrace`: see `openStoreForReading`.
 std::optional<StoreFailure> doubtDamage(const std::string& path,
                                         const std::shared_ptr<BusyBudget>& busy,
                                         bool leavesNoTrace);

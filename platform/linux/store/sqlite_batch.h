@@ -5,9 +5,9 @@
 //   (*batch)->setScalar(day, "com.example.starts", 3);
 //   (*batch)->commit();
 //
-// Rows wait in memory up to a bound. From the first that is written until the commit other writers
-// wait, so that a small batch holds them up only while it is committed. A batch that is not
-// committed leaves nothing. After a failure it can only be given up.
+// Rows wait in memory up to a bound. Other writers wait from the first row written until the
+// commit, so a small batch holds them up only while it commits. A batch that is not committed
+// leaves nothing behind. After a failure it can only be discarded.
 //
 // Values that were kept beside the store (kept_values.h) are taken in before a batch's own.
 #pragma once
@@ -33,7 +33,8 @@ namespace tavrel {
 
 class SqliteBatch {
  public:
-  /// `file` is the store's file, when it was there before the connection. Throws `StoreFailure`.
+  /// `file` identifies the store's file, if it existed before the connection. Throws
+  /// `StoreFailure`.
   SqliteBatch(SqliteConnection connection, const StoreSite& site,
               std::optional<FileIdentity> file = std::nullopt);
   ~SqliteBatch();
@@ -42,8 +43,8 @@ class SqliteBatch {
 
   /// A key longer than `limits::kStoreKeyBytes` is refused, here and below.
   Status setScalar(std::int32_t day, std::string_view key, std::int64_t value);
-  /// Adds to the day's value, which is 0 when absent. A sum outside of 64 bits is refused and
-  /// leaves the value as it was.
+  /// Adds to the day's value, which is 0 when absent. A sum that overflows 64 bits is refused and
+  /// leaves the value unchanged.
   Status addScalar(std::int32_t day, std::string_view key, std::int64_t amount);
   /// The day's value as this batch leaves it; nothing when there is none.
   Expected<std::optional<std::int64_t>> scalar(std::int32_t day, std::string_view key);
@@ -51,8 +52,8 @@ class SqliteBatch {
                      double value);
   Status appendValues(std::int32_t day, std::string_view key,
                       std::span<const DistributionSample> samples);
-  /// The values that wait, for whoever appends many one by one to keys that are short enough.
-  /// `limitWaiting` belongs behind some 200,000 of them at most.
+  /// The waiting values, for callers that append many one by one and have checked the keys' length.
+  /// Call `limitWaiting` at least every 200,000 values.
   PendingDistributions& waitingDistributions() { return distributions_; }
   /// Writes them when they take too much memory.
   Status limitWaiting();
@@ -69,32 +70,32 @@ class SqliteBatch {
                             std::string_view position);
   Status removeSegmentPosition(std::uint32_t owner, std::span<const std::byte, 16> identity);
 
-  /// As `SqliteTrim::bytesInUse`, with what this batch has written.
+  /// As `SqliteTrim::bytesInUse`, including what this batch has written.
   Expected<std::int64_t> bytesInUse();
 
-  /// From now on, values for a distribution that takes none, as its row is damaged or full, are
-  /// dropped in place of failing the batch. The first such row is a line in the log.
+  /// From now on, values for a distribution whose row is damaged or full are dropped instead of
+  /// failing the batch. The first such row is logged.
   void refuseUnwritableSeries() { refuses_ = true; }
-  /// Writes the distributions that wait, and yields how many values were dropped so far.
+  /// Writes the waiting distributions, and returns how many values were dropped so far.
   Expected<std::uint64_t> refusedValues();
 
   /// Keeps the changes and ends the batch.
   Status commit();
 
-  /// The damage of the store that has made an operation fail, with the file in which it is.
+  /// Damage in the store that has made an operation fail, and the damaged file.
   struct Damage {
     std::optional<FileIdentity> file;
     StoreFailure failure;
   };
   const std::optional<Damage>& damage() const { return damage_; }
 
-  /// Makes other writers wait, gives the store the present schema and takes kept values in; for use
-  /// inside the store, as what follows: they throw `StoreFailure`.
+  /// Makes other writers wait, updates the store's schema and takes in kept values. This and the
+  /// following are for use inside the store only: they throw `StoreFailure`.
   void begin();
   /// As `setScalar` and `commit`.
   void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void finish();
-  /// The connection, when the batch has been finished.
+  /// Hands over the connection once the batch is finished.
   SqliteConnection release();
 
  private:
@@ -123,7 +124,7 @@ class SqliteBatch {
   const std::optional<FileIdentity> file_;
   std::optional<Damage> damage_;
   KeptValues kept_;
-  std::optional<std::uint32_t> takenNumber_;  // of the last kept values in this transaction
+  std::optional<std::uint32_t> takenNumber_;  // of the last values taken in
   std::unique_ptr<Statements> statements_;
   bool begun_ = false;
   std::vector<PendingScalar> scalars_;

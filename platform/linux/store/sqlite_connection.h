@@ -1,8 +1,8 @@
 // A thin ownership layer over SQLite for the statistics store.
 //
 // `SqliteConnection` owns a connection, `SqliteStatement` a compiled statement of it; a statement
-// must not outlive its connection. Inside the store every failure is thrown as a `StoreFailure`;
-// the store's public operations catch it, so that it never leaves this folder.
+// must not outlive its connection. Inside the store every failure is thrown as a `StoreFailure`,
+// which the store's public operations catch, so it never leaves this folder.
 //
 //   SqliteStatement statement(connection, "SELECT value FROM scalars WHERE day = ?1");
 //   statement.bind(1, day);
@@ -25,11 +25,11 @@ namespace tavrel {
 class IndexRoom;
 
 enum class StoreFault : std::uint8_t {
-  Damaged,  // SQLite finds the file corrupt, or not a database
+  Damaged,  // SQLite reports the file as corrupt, or as no database
   Busy,     // another process held its lock for too long
-  Refused,  // the system denies this user, or everybody, the file
+  Refused,  // the system denies access to the file
   Device,   // reading or writing fails, because of a fault or lack of space
-  Foreign,  // a file that this program did not make or does not know, and leaves alone
+  Foreign,  // no file that this program made or knows; left alone
   Other,
 };
 
@@ -42,11 +42,11 @@ struct StoreFailure : std::exception {
   std::string message;
 };
 
-/// What can be done about a failure of the system; `otherwise` when its code does not say.
+/// Advice about a failed system call by its error code; `otherwise` for other codes.
 const char* adviceFor(int systemCode, const char* otherwise);
 
-/// How long to wait for locks of other processes: one amount that all waits share and use up; it is
-/// never refilled. For one thread.
+/// How long to wait for locks of other processes: one amount of time that all waits use up and that
+/// is never refilled. Not thread-safe.
 class BusyBudget {
  public:
   explicit BusyBudget(int milliseconds) : left_(std::chrono::milliseconds(milliseconds)) {}
@@ -63,7 +63,7 @@ class SqliteConnection {
   enum class Access : std::uint8_t {
     Create,      // read and write; an absent file is created
     WriteAlone,  // read and write; keeps all others out, and needs no file for the log's index
-    Read,        // read; uses the write-ahead log as far as the user may
+    Read,        // read; uses the write-ahead log as far as permissions allow
     ReadAlone,   // read; keeps all others out, and needs no file for the log's index
     Immutable,   // read a file that no process writes, without locks or a log
   };
@@ -81,12 +81,11 @@ class SqliteConnection {
 
   enum class LogFile : std::uint8_t {
     Kept,    // keeps its blocks for the next commits; see sqlite_log_file.h
-    CutOff,  // nothing of what it held is left in it
+    CutOff,  // nothing of its content is left
   };
 
   /// Moves the write-ahead log into the database and empties it. False when other processes
-  /// prevented part of that, for as long as is waited for them; as much as possible has then been
-  /// moved.
+  /// prevented part of that for the whole wait; as much as possible has then been moved.
   bool checkpoint(bool waits = true, LogFile file = LogFile::Kept);
 
   sqlite3* handle() const { return handle_; }
@@ -115,8 +114,8 @@ class SqliteStatement {
   void reset();
   /// Runs to the end and makes the statement ready to run again.
   void run();
-  /// As `run`, for a change of rows that were found in the same transaction: the store is damaged
-  /// when it finds none of them.
+  /// As `run`, for a change of rows that the same transaction has found: a change that affects none
+  /// means that the store is damaged.
   void runOnFound();
 
   bool isNull(int column) const;

@@ -1,6 +1,6 @@
-// Removes rows from the statistics store so that their content is gone from its files.
+// Removes rows from the statistics store and their content from its files.
 //
-// It works in short transactions, between which others read and write. A process that is killed
+// It works in short transactions, between which others can read and write. A process that is killed
 // has removed some rows; the next erasure removes the rest.
 //
 //   StoreErasure erasure(connection, path);
@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// Rows by the beginning of their keys and by their days, both included; by default all.
+/// Rows by key prefix and by first and last day, both included; by default all rows.
 struct RowRange {
   std::string prefix;
   std::int32_t firstDay = std::numeric_limits<std::int32_t>::min();
@@ -31,10 +31,11 @@ struct ErasedRows {
   std::uint64_t scalars = 0;
   std::uint64_t distributions = 0;
   std::uint64_t values = 0;  // of those distributions
-  /// Distributions whose rows do not say where their values are; those stay in the file.
+  /// Distributions with damaged rows, which no longer say where their values are; those values stay
+  /// in the file.
   std::uint64_t damaged = 0;
-  /// Whether all pages were written again. Otherwise parts of pages that hold no row may still have
-  /// bytes of removed rows, from when SQLite moved these to other pages.
+  /// Whether all pages were rewritten. Otherwise unused parts of pages may still hold bytes of
+  /// removed rows that SQLite once moved to other pages.
   bool isCopied = true;
   /// Whether the write-ahead log, with what the pages held before, is gone.
   bool isLogEmpty = true;
@@ -46,17 +47,17 @@ class StoreErasure {
  public:
   StoreErasure(SqliteConnection& connection, std::string storePath);
 
-  /// Overwrites the pages that are free now: they may hold what was removed earlier. The caller
-  /// holds a `StoreFolderLock`, as for `dropPages`.
+  /// Overwrites the pages that are free now, since they may hold rows removed earlier. The caller
+  /// must hold a `StoreFolderLock`, as for `dropPages`.
   void clearFreePages();
-  /// Whether an erasure is at that, or was killed, and so holds pages; and their end.
+  /// Whether an erasure holds free pages, because it is running or was killed; and their release.
   static bool hasLeftPages(SqliteConnection& connection);
   static void dropPages(SqliteConnection& connection);
   ErasedRows eraseRows(const RowRange& range);
-  /// Removes values to which no row refers, when there are no rows.
+  /// When there are no rows, removes all values: no row refers to them.
   void eraseStrayChunks();
-  /// Writes what is left into new pages and gives the others back to the file system. False, and
-  /// nothing is done, for a store that would keep other writers waiting for long.
+  /// Rewrites the remaining content into new pages and gives the old ones back to the file system.
+  /// Does nothing and returns false for a store so large that other writers would wait long.
   bool copyPages();
   /// False while other processes need the log.
   bool emptyLog() { return connection_.checkpoint(true, SqliteConnection::LogFile::CutOff); }

@@ -1,7 +1,7 @@
 // The reader of the statistics store.
 //
-// Each query sees the store as it was when the query began, whatever others write meanwhile. The
-// values of a distribution are read only on demand, one chunk at a time.
+// Each query sees the store as it was when the query began, whatever others write in the meantime.
+// The values of a distribution are read only on demand, one chunk at a time.
 //
 //   auto history = store.openHistory();
 //   if (history) (*history)->walkScalars("com.example.", first, last, handler);
@@ -27,7 +27,7 @@ class ChunkReader;
 
 class SqliteHistory : public BHHistory {
  public:
-  /// A history without a store has no rows. `identity` is the store's file as it was before it was
+  /// A history without a store has no rows. `identity` is that of the store's file before it was
   /// opened. The services of `site` must outlive the history.
   SqliteHistory(StoreSite site, std::optional<FileIdentity> identity,
                 std::optional<ReadableStore> store);
@@ -48,14 +48,14 @@ class SqliteHistory : public BHHistory {
                          BHHistoryDistributionEnumerator& values, bool& stop)>;
 
   /// Rows whose key begins with `prefix`, from `firstDay` to `lastDay`, both included, ordered by
-  /// day and then by key. On failure the rows before it have been delivered. A distribution whose
-  /// values could not all be read fails the walk at its end, after all other rows.
+  /// day and then by key. On failure the rows before it have been delivered. When some values of a
+  /// distribution cannot be read, the walk still delivers all other rows and then fails.
   Status walkScalars(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                      const ScalarRowHandler& rowHandler);
   Status walkDistributions(std::string_view prefix, std::int32_t firstDay, std::int32_t lastDay,
                            const CountedRowHandler& rowHandler);
 
-  /// The rows of one key by day, in the same way. Costs one look-up for each day in the store.
+  /// The rows of one key by day; otherwise as above. Costs one look-up for each day in the store.
   Status walkScalar(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
                     const ScalarRowHandler& rowHandler);
   Status walkDistribution(std::string_view key, std::int32_t firstDay, std::int32_t lastDay,
@@ -67,31 +67,32 @@ class SqliteHistory : public BHHistory {
   };
   /// The first and the last day in the store; nothing when the store is empty.
   Expected<std::optional<DaySpan>> daysHeld();
-  /// All days that have statistics, ascending. Costs two look-ups for each.
+  /// All days that have statistics, ascending. Costs two look-ups per day.
   Expected<std::vector<std::int32_t>> days();
   /// Bytes of the pages that hold something, without the log.
   Expected<std::int64_t> bytesInUse();
 
-  /// How far a segment was folded; nothing when unknown. Agrees with the values that were read
-  /// since `beginSnapshot`.
+  /// How far a segment was folded; nothing when unknown. Consistent with the values read since
+  /// `beginSnapshot`.
   Expected<std::optional<std::string>> segmentPosition(std::uint32_t owner,
                                                        std::span<const std::byte, 16> identity);
 
   struct Examination {
-    bool isWhole = true;  // otherwise the time ran out, and what was seen is sound
+    bool isWhole = true;  // false: the time ran out, and no damage was found so far
     std::string fault;    // the first one that was found; empty when there is none
   };
-  /// Looks for damage in the file, for about as long as given.
+  /// Looks for damage in the file, for about as long as `time`.
   Expected<Examination> examine(std::chrono::milliseconds time);
 
-  /// From here on all queries see the store as it is at the first of them.
+  /// From now on all queries see the store as it is at the first of them.
   Status beginSnapshot();
 
  private:
   enum class Order : std::uint8_t { KeyThenDay, DayThenKey };
   struct Selection;
   void readScalars(const Selection& selection, const ScalarRowHandler& rowHandler);
-  /// Damage that SQLite finds ends the walk; other rows with missing values are reported to `tell`.
+  /// Damage that SQLite finds ends the walk; rows whose values are otherwise missing are reported
+  /// to `tell`.
   using FailureHandler = std::function<void(const StoreFailure& failure)>;
   void readDistributions(const Selection& selection, const CountedRowHandler& rowHandler,
                          const FailureHandler& tell);

@@ -1,9 +1,9 @@
-// Room for the index of SQLite's write-ahead log.
+// Reserves storage for the index of SQLite's write-ahead log.
 //
 // SQLite maps the index, the "-shm" file, and writes into the mapping. It extends the file by
 // writing one byte per page of 4 KiB, which leaves holes on a file system with smaller blocks. On a
-// full disk, a write into a hole raises SIGBUS. An `IndexRoom` has every page of the index
-// allocated before SQLite sees it. Without enough room, writers and readers then get SQLITE_FULL.
+// full disk, a write into a hole raises SIGBUS. An `IndexRoom` allocates every page of the index
+// before SQLite sees it. On a full disk, writers and readers then get SQLITE_FULL.
 #pragma once
 
 #include <sqlite3.h>
@@ -12,15 +12,15 @@ namespace tavrel {
 
 class IndexRoom {
  public:
-  /// Intercepts the calls of the connection, which must not have run a statement yet, on its file.
-  /// Must outlive the connection.
+  /// Intercepts the connection's calls on its file. The connection must not have run a statement
+  /// yet. Must outlive the connection.
   explicit IndexRoom(sqlite3* connection);
   IndexRoom(const IndexRoom&) = delete;
   IndexRoom& operator=(const IndexRoom&) = delete;
 
  private:
-  // SQLite calls this instead of the file's own methods. It is the first member: the address that
-  // SQLite has leads back to the other members.
+  // SQLite calls this instead of the file's own methods. It must be the first member: SQLite's
+  // pointer to it also leads to the other members.
   struct Methods {
     sqlite3_io_methods replaced;
     const sqlite3_io_methods* own;

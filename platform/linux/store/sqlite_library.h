@@ -1,7 +1,7 @@
 // SQLite, loaded when it is first used.
 //
-// Most runs of the daemon find the day done and never open the store. Resolving the library's own
-// symbols would take longer than the rest of such a run.
+// Most runs of the daemon find the day's tasks done and never open the store. Resolving the
+// library's symbols would take longer than the rest of such a run.
 #pragma once
 
 #include <sqlite3.h>

@@ -1,9 +1,9 @@
 // The file of SQLite's write-ahead log, "-wal".
 //
-// SQLite empties the log by cutting the file off. The next commits would then lengthen it again,
-// and each would have the file system write its own tables: on ext4 some 20 KB for each commit. A
-// log that is emptied here keeps its file up to `kKeptLogBytes`; only its head is overwritten with
-// zeros. For SQLite, and for the programs that use it, such a log holds nothing.
+// SQLite empties the log by truncating the file. The next commits then extend it again, and each
+// makes the file system write its metadata: on ext4 some 20 KB per commit. A log emptied here keeps
+// up to `kKeptLogBytes` of its file, and only its header is overwritten with zeros. To SQLite, and
+// to the programs that use it, such a log is empty.
 #pragma once
 
 #include <cstdint>
@@ -17,7 +17,7 @@ inline constexpr std::int64_t kKeptLogBytes = 1 << 20;
 /// Whether the store at `path` has a log that may hold something.
 bool logHoldsPages(const std::string& path);
 
-/// While it lives, the connection empties its log in this way.
+/// During its lifetime, the connection empties its log in this way.
 class KeptLogFile {
  public:
   /// The connection must outlive it, and have read something.
@@ -27,8 +27,8 @@ class KeptLogFile {
   KeptLogFile& operator=(const KeptLogFile&) = delete;
 
  private:
-  // SQLite calls this instead of the file's own methods. It is the first member: the address that
-  // SQLite has leads back to the other members.
+  // SQLite calls this instead of the file's own methods. It must be the first member: SQLite's
+  // pointer to it also leads to the other members.
   struct Methods {
     sqlite3_io_methods replaced;
     const sqlite3_io_methods* own;

@@ -1,5 +1,5 @@
-// The store's schema and its statements, and opening a file that has it. docs/store.md describes
-// the tables for users of other tools.
+// The store's schema and statements, and how a file with that schema is opened. docs/store.md
+// describes the tables for users of other tools.
 #pragma once
 
 #include <cstdint>
@@ -26,7 +26,7 @@ inline constexpr std::string_view kOfDay = "WHERE day = ?1 AND key >= ?2 ORDER B
 inline constexpr std::string_view kByKey =
     "WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4) ORDER BY key, day";
 
-/// As above, in the order in which the rows are kept.
+/// As above, in the order in which the rows are stored.
 inline constexpr std::string_view kByDay =
     "WHERE day BETWEEN ?1 AND ?2 AND key >= ?3 AND (?4 IS NULL OR key < ?4) ORDER BY day, key";
 
@@ -34,17 +34,17 @@ inline constexpr std::string_view kByDay =
 inline constexpr std::string_view kNext =
     "WHERE (day, key) >= (?1, ?2) AND day <= ?3 ORDER BY day, key LIMIT 1";
 
-/// One of the above, with the rows' key, day and value.
+/// A query with one of the above for `rows`, which yields key, day and value.
 std::string scalars(std::string_view rows);
 
-/// One of the above, with the rows' key, day and count, and the place of the values: runs
-/// (chunk_runs.h), or a series in version 1.
+/// A query with one of the above for `rows`, which yields key, day, count and the location of the
+/// values: runs (chunk_runs.h), or a series in version 1.
 std::string distributions(std::string_view rows, std::int64_t version);
 
 /// The first key above every key that begins with `prefix`; nothing when there is none.
 std::optional<std::string> keyAbove(std::string_view prefix);
 
-/// ?1 first chunk, ?2 chunk behind the last.
+/// ?1 first chunk, ?2 the one after the last.
 inline constexpr std::string_view kChunks =
     "SELECT chunk, data FROM chunks WHERE chunk >= ?1 AND chunk < ?2 ORDER BY chunk";
 
@@ -53,14 +53,14 @@ inline constexpr std::string_view kChunks =
 /// The version of the store's schema; 0 for an empty file.
 std::int64_t schemaVersion(SqliteConnection& connection);
 
-/// Gives a store of version 1 the present schema, in the transaction that has begun, and ends it.
+/// Gives a store of version 1 the present schema, within the current transaction, and commits it.
 void migrate(SqliteConnection& connection);
 
 enum class Sharing : std::uint8_t {
   WithReaders,
-  /// Readers wait until the connection is closed; where one is there already, it is shared after
-  /// all. The log's index is then in memory, and no file of it wears out the flash. For changes
-  /// that are soon done.
+  /// Readers wait until the connection is closed; if the store already has one, it is shared after
+  /// all. The log's index is then in memory, so that no index file wears out the flash. For short
+  /// changes.
   Avoided,
 };
 
@@ -72,8 +72,8 @@ SqliteConnection openStoreForWriting(const std::string& path,
 
 struct ReadableStore {
   SqliteConnection connection;
-  /// The file as it was before a read without locks and without a log; otherwise nothing. What was
-  /// read is valid if this has not changed.
+  /// Set for a read without locks and log: the file before that read. What was read is valid only
+  /// if the file still has this version.
   std::optional<FileVersion> lockless;
 };
 

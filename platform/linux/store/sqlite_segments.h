@@ -1,5 +1,5 @@
-// The table that remembers how far each segment of the store's clients was folded. It is changed in
-// the transaction that takes a segment's values, so that each of them is taken once.
+// The table that records how far each segment of the store's clients was folded. It changes in the
+// transaction that takes a segment's values, so that each value is taken once.
 #pragma once
 
 #include <array>
@@ -24,7 +24,7 @@ struct SegmentName {
   bool operator==(const SegmentName&) const = default;
 };
 
-/// The operations throw `StoreFailure`. Version 1 of the schema has no such table.
+/// The operations throw `StoreFailure`. A store of schema version 1 has no such table.
 namespace segment_table {
 
 std::optional<std::string> position(SqliteConnection& connection, std::uint32_t owner,
@@ -34,7 +34,7 @@ std::vector<SegmentName> names(SqliteConnection& connection);
 /// Bytes of the positions of one user's segments, and of all.
 std::int64_t positionBytes(SqliteConnection& connection, std::uint32_t owner);
 std::int64_t positionBytes(SqliteConnection& connection);
-/// Inside a transaction.
+/// Call these inside a transaction.
 void setPosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity,
                  std::string_view position);
 void removePosition(SqliteConnection& connection, std::uint32_t owner, SegmentIdentity identity);

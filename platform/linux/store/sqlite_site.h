@@ -1,4 +1,4 @@
-// The path of the statistics store, and what happens when its file turns out to be unusable.
+// The path of the statistics store, and what to do when its file turns out to be unusable.
 #pragma once
 
 #include <cstdint>
@@ -31,7 +31,7 @@ struct FileIdentity {
 /// belong to this user.
 void withholdFromOthers(const std::string& path);
 
-/// Which file is at a path, and when it last changed.
+/// The file at a path, with its size and last change.
 struct FileVersion {
   FileIdentity identity;
   std::int64_t bytes = 0;
@@ -42,8 +42,8 @@ struct FileVersion {
   static std::optional<FileVersion> of(const std::string& path);
 };
 
-/// Held while the store's file is created or set aside, so that of several processes one does it.
-/// The lock is the one of the store's folder and goes with the process.
+/// Held while the store's file is created or set aside, so that only one process does so. It locks
+/// the store's folder, and ends with the process.
 class StoreFolderLock {
  public:
   /// Throws `StoreFailure` when the lock cannot be taken in time.
@@ -63,7 +63,7 @@ struct StoreSite {
   /// For readers that change nothing: a damaged store stays where it is, and reading makes no log
   /// files beside the store.
   bool changesNothing = false;
-  /// Failures that only somebody's intervention ends: they are told once.
+  /// Failures already logged. Those that last until somebody intervenes are logged only once.
   std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
 
   /// "statistics store PATH: MESSAGE".
@@ -72,10 +72,10 @@ struct StoreSite {
   /// One line in the system log, with `consequence` at its end.
   void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
 
-  /// Moves a damaged store with its log files to names of their own, counts it and says so, once a
-  /// second look has confirmed the damage. `damaged` is the file that was found damaged: nothing is
-  /// done when another process has already replaced it. Yields the failure; when the store could
-  /// not be moved, with the reason. No connection to the store may be open.
+  /// Renames a damaged store and its log files, counts and logs that, once a second look has
+  /// confirmed the damage. `damaged` is the file that was found damaged: nothing is done when
+  /// another process has already replaced it. Returns the failure, with the reason when the store
+  /// could not be moved. No connection to the store may be open.
   std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
                                        const StoreFailure& failure) const;
 };

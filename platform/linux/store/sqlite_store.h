@@ -38,8 +38,8 @@ namespace tavrel {
 
 class SqliteStore : public StatisticsStore {
  public:
-  /// The services must outlive the store. `busyMilliseconds`: how long a locked store is waited
-  /// for, in all operations together. `changesNothing`: the store is only read; see `StoreSite`.
+  /// The services must outlive the store. `busyMilliseconds`: how long all operations together wait
+  /// for a locked store. `changesNothing`: the store is only read; see `StoreSite`.
   SqliteStore(const DeviceRoot& root, Clock& clock, Preferences& preferences, SystemLog& log,
               int busyMilliseconds = limits::kStoreBusyMilliseconds, bool changesNothing = false);
   ~SqliteStore() override;
@@ -47,48 +47,49 @@ class SqliteStore : public StatisticsStore {
   std::int32_t BHDaysSince1970() override;
   plist::Date dateForDaysSince1970(std::int32_t day) override;
 
-  /// When other processes are reading or writing all the time that is waited for, what they still
-  /// need stays in the log; a line says so, and the next checkpoint moves it.
+  /// When other processes use the store for the whole wait, the part of the log that they need
+  /// stays; a line says so, and the next checkpoint moves it.
   bool BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
 
-  /// Commits the values set so far and those that were kept. False when they are in memory only.
+  /// Commits the values set so far and the kept ones. False when values remain in memory only.
   bool commit();
 
   /// The store's file, under the device root.
   const std::string& path() const { return site_.path; }
 
-  /// A transaction of many changes; the store is created when there is none.
+  /// Begins a transaction of many changes; creates the store when there is none.
   Expected<std::unique_ptr<SqliteBatch>> beginBatch(Sharing sharing = Sharing::WithReaders);
 
-  /// Gives a batch up that has failed with `error`. Done when the store was damaged and has been
-  /// set aside: the next batch fills a new one. Otherwise the error, with what was in the way.
+  /// Discards a batch that has failed with `error`. Succeeds when the store was damaged and has
+  /// been set aside: the next batch fills a new one. Otherwise returns the error, with what
+  /// prevented that.
   Status replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Error& error);
 
-  /// To remove days; null when there is no store.
+  /// Opens the store to remove days; null when there is none.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
 
   /// The history with its wider set of queries; without rows when there is no store yet.
   Expected<std::unique_ptr<SqliteHistory>> openHistory();
 
-  /// Removes rows, also those that are kept beside the store, and overwrites what they held. After
-  /// a failure some may be gone. What a damaged store holds is set aside with it; unless everything
-  /// was to go, that is a failure.
+  /// Removes rows, including values kept beside the store, and overwrites their content. After a
+  /// failure some may be gone. A damaged store is set aside with its content, which is a failure
+  /// unless all rows were to be removed.
   Expected<ErasedRows> erase(const RowRange& range);
 
  private:
   SqliteConnection openForWriting(Sharing sharing);
-  /// Keeps the values that a failure has left uncommitted. False when they could not be kept.
+  /// Keeps the values that `failure` has left uncommitted. False when they could not be kept.
   bool keep(const StoreFailure& failure);
   /// As above; hands on the connection when something was committed.
   bool commit(std::optional<SqliteConnection>& connection);
-  /// Opens the store when there is a log and no connection.
+  /// Without a connection, opens the store if it has a log.
   void checkpoint(std::optional<SqliteConnection> connection);
   std::unique_ptr<SqliteHistory> openForReading(const std::optional<FileIdentity>& identity);
 
   /// Runs `operation` with the identity of the store's file. When it finds the store damaged, sets
-  /// that aside and runs the operation once more. Yields the remaining failure.
+  /// the store aside and runs the operation once more. Returns the remaining failure.
   template <class Operation>
   std::optional<StoreFailure> attempt(Operation operation);
 

@@ -5,9 +5,9 @@
 //   for (const std::int32_t day : *(*trim)->days()) (*trim)->removeDay(day);
 //   (*trim)->giveBack(reserve);
 //
-// Both work in small transactions with pauses between them, so that other writers wait for
-// milliseconds. Each transaction takes rows with their values: after a kill a day may be removed in
-// part, and the next trim goes on with it. The cost depends on what is removed and not on what
+// `removeDay` and `giveBack` work in small transactions with pauses between them, so other writers
+// wait only milliseconds. Each transaction removes rows with their values: after a kill a day may
+// be partly removed, and the next trim continues. The cost depends on what is removed, not on what
 // stays.
 #pragma once
 
@@ -30,20 +30,20 @@ class SqliteTrim {
   SqliteTrim(SqliteConnection connection, const StoreSite& site)
       : connection_(std::move(connection)), site_(site) {}
 
-  /// The days that have statistics, ascending. Costs two look-ups for each.
+  /// The days that have statistics, ascending. Costs two look-ups per day.
   Expected<std::vector<std::int32_t>> days();
 
-  /// Bytes of the pages that hold something, without the log and without the positions of segments,
-  /// which belong to no day.
+  /// Bytes of the pages in use, without the log and without the positions of segments, which belong
+  /// to no day.
   Expected<std::int64_t> bytesInUse();
 
-  /// Removes the scalars and distributions of a day. On a full disk it makes do with little room
+  /// Removes the scalars and distributions of a day. On a full disk it manages with little room
   /// before it fails.
   Status removeDay(std::int32_t day);
 
-  /// Shortens the file until at most so many bytes of it are free. A store that was made without
-  /// the means for that is converted once, when it is small and the file system has room; a larger
-  /// one keeps its free pages for later values.
+  /// Shortens the file until at most `freeBytesKept` of it are free. A store created without
+  /// support for that is converted once, if it is small and the file system has room; a larger one
+  /// keeps its free pages for later values.
   Status giveBack(std::int64_t freeBytesKept);
 
  private:

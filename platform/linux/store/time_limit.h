@@ -1,4 +1,4 @@
-// A limit on the time of a query that could take long.
+// A time limit for a query that could take long.
 //
 //   const TimeLimit limit(connection, std::chrono::seconds(1));
 //   while (statement.step()) ...  // throws once the limit has passed
@@ -14,7 +14,7 @@
 
 namespace tavrel {
 
-/// Interrupts what a connection does when a time has passed. The connection must outlive it.
+/// Interrupts the connection's work after `time`. The connection must outlive it.
 class TimeLimit {
  public:
   TimeLimit(const SqliteConnection& connection, std::chrono::milliseconds time);

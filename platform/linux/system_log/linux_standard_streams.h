@@ -1,5 +1,6 @@
-// The standard streams of the process. Under the journal a text on standard error becomes an entry
-// at debug level: it shows developers how a run went, and would otherwise look like trouble.
+// The standard streams of the process. Under the journal, text on standard error becomes an entry
+// at debug level: it shows developers how a run went, and at a higher level would look like an
+// error.
 #pragma once
 
 #include "platform/linux/system_log/linux_system_log.h"

@@ -1,15 +1,15 @@
 // The system log: the journal, or standard error without one.
 //
-// Under the service manager standard error is connected to the journal, and JOURNAL_STREAM says to
-// which stream. Entries then go to the journal's own socket, so that an entry of several lines
-// stays one entry and is not mixed with what is printed on standard error. Otherwise each entry is
-// written on standard error at once, as "TIME LEVEL message", further lines indented and control
-// characters escaped.
+// Under the service manager standard error is connected to the journal, and JOURNAL_STREAM
+// identifies that stream. Entries then go to the journal's own socket, so that an entry of several
+// lines stays one entry and is not mixed with what is printed on standard error. Otherwise each
+// entry is written on standard error at once, as "TIME LEVEL message", further lines indented and
+// control characters escaped.
 //
-// A message above debug level that is longer than `kLongestMessage` is cut there, says at its end
+// A message above debug level that is longer than `kLongestMessage` is cut there, with a note of
 // how much is missing, and follows whole at debug level.
 //
-// Every level is written; what to keep and what to show is the journal's business.
+// Every level is written; the journal decides what to keep and show.
 #pragma once
 
 #include <cstddef>
@@ -30,10 +30,10 @@ class LinuxSystemLog final : public SystemLog {
 
   void write(LogLevel level, std::string_view message) override;
 
-  /// Whether standard error is the journal's.
+  /// Whether standard error is connected to the journal.
   bool isJournal();
 
-  /// Bytes of a message, without the note about what was cut.
+  /// In bytes, without the note about what was cut.
   static constexpr std::size_t kLongestMessage = 8192;
 
  private:
