@@ -18,7 +18,7 @@ namespace {
 
 using namespace binary;
 
-// Each value is one object, and at most one more is its key.
+// Each value is one object, and may have one more as its key.
 constexpr std::size_t kLargestObjectCount = 2 * limits::kPropertyListValues;
 
 // A big-endian word of 1 to 8 bytes; the caller has checked that they exist.
@@ -33,7 +33,7 @@ bool isAscii(std::string_view text) {
   return std::ranges::none_of(text, [](char byte) { return (byte & 0x80) != 0; });
 }
 
-// Operations return false for a failure, and `error_` then says which.
+// Operations return false on failure, and set `error_`.
 class BinaryReader {
  public:
   explicit BinaryReader(ByteSpan bytes) : bytes_(bytes) {}
@@ -47,7 +47,7 @@ class BinaryReader {
  private:
   struct Reference {
     std::uint64_t number;  // of the object
-    std::size_t at;        // where the reference stands
+    std::size_t at;        // where the reference is
   };
   // An object whose marker has been read.
   struct Object {
@@ -254,8 +254,8 @@ bool BinaryReader::readReal(const Object& object, Value& out) {
   return true;
 }
 
-// Data may be written in place, so each reference has its own, and objects may overlap: without a
-// limit a small document could ask for any amount of memory. Texts are shared, but printing or
+// Data can be modified in place, so each reference gets a copy, and objects may overlap: without a
+// limit, a small document could demand any amount of memory. Texts are shared, but printing or
 // encoding the value writes each reference in full.
 bool BinaryReader::admitBytes(std::size_t offset, std::size_t count) {
   contentBytes_ += count;

@@ -22,7 +22,7 @@ namespace {
 
 using namespace binary;
 
-// The narrowest of 1, 2, 4 and 8 bytes.
+// The smallest sufficient width of 1, 2, 4 and 8 bytes.
 std::size_t widthOf(std::uint64_t word) {
   if (word <= 0xFF) return 1;
   if (word <= 0xFFFF) return 2;
@@ -45,7 +45,7 @@ void appendMarker(std::string& out, unsigned type, std::size_t length) {
   appendWord(out, length, width);
 }
 
-// The bits of a scalar that is not text, and the marker they are written with.
+// The bits of a scalar that is not text, and the marker with which they are written.
 struct Word {
   std::uint64_t bits;
   std::uint8_t marker;
@@ -56,7 +56,7 @@ struct Word {
 constexpr std::uint8_t kWidestInteger = 16;
 
 Word wordOfReal(double real, bool isFloat) {
-  if (std::isnan(real)) real = std::numeric_limits<double>::quiet_NaN();  // one pattern for all
+  if (std::isnan(real)) real = std::numeric_limits<double>::quiet_NaN();  // one bit pattern for all
   if (!isFloat) return {std::bit_cast<std::uint64_t>(real), kReal | 3, 8};
   return {std::bit_cast<std::uint32_t>(static_cast<float>(real)), kReal | 2, 4};
 }
@@ -72,8 +72,8 @@ Word wordOf(const Number& number) {
           static_cast<std::uint8_t>(width)};
 }
 
-// Numbers the objects in the order of a walk over the values. Then the width of references is
-// known, and it writes the objects in that order.
+// Numbers the objects in the order of a walk over the values. Once the width of references is
+// known, writes the objects in that order.
 class BinaryWriter {
  public:
   Expected<std::string> write(const Value& root) {
@@ -93,7 +93,7 @@ class BinaryWriter {
   }
 
  private:
-  // One object: its type is its marker without the length. Borrows from the values.
+  // One object; `type` is its marker without the length. Borrows from the values.
   struct Object {
     std::uint64_t hash = 0;  // of numbers, dates, booleans and texts
     std::uint8_t type = 0;
@@ -127,8 +127,8 @@ class BinaryWriter {
   std::vector<std::size_t> references_;
   std::vector<std::uint32_t> slots_;  // object number + 1, 0 for a free slot; a power of two
   std::size_t uniqueObjects_ = 0;
-  std::size_t contentBytes_ = 0;  // of texts and data, each as often as it occurs, as readers count
-  std::size_t last_ = 0;          // the object that was numbered or met last
+  std::size_t contentBytes_ = 0;  // of texts and data, counted once per occurrence, as readers do
+  std::size_t last_ = 0;          // the object numbered or found last
   std::string out_;
 };
 
@@ -214,7 +214,7 @@ void BinaryWriter::addUnique(const Object& object) {
   last_ = slot - 1;
 }
 
-// The slot of an equal object, or the free one where it belongs.
+// The slot of an equal object, or the free slot where this one belongs.
 std::uint32_t& BinaryWriter::slotFor(const Object& object) {
   const std::size_t mask = slots_.size() - 1;
   auto at = static_cast<std::size_t>(object.hash) & mask;

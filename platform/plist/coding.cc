@@ -8,7 +8,7 @@
 namespace tavrel::plist {
 namespace {
 
-// Any XML document begins, after a byte-order mark and white space, with "<".
+// Any XML document begins with "<", after an optional byte-order mark and white space.
 bool looksLikeXml(std::string_view text) {
   using namespace std::string_view_literals;
   for (const std::string_view start : {"\xFE\xFF"sv, "\xFF\xFE"sv, "<\0"sv, "\0<"sv}) {

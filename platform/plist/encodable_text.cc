@@ -38,7 +38,8 @@ bool isEncodable(std::string_view text, Alphabet alphabet) {
     const std::string_view before = text;
     const char32_t codePoint = takeCodePoint(text);
     if (alphabet == Alphabet::Xml && !isXmlCharacter(codePoint)) return false;
-    // A replacement character of the text itself is three bytes long.
+    // A replacement character that is part of the text takes three bytes; one takes only one byte
+    // when it stands for a malformed byte.
     if (codePoint == kReplacementCharacter && before.size() - text.size() == 1) return false;
   }
 }

@@ -79,8 +79,8 @@ void SortedEntries::repairKeys(std::size_t first) {
       lacking.push_back(&items_[i]);
     }
   }
-  // The numbers continue from the last one for the same text, so that many keys that become equal
-  // do not need a search each.
+  // Numbers continue from the last one for the same text, so that many keys that become equal do
+  // not each need a full search.
   std::map<std::string, std::size_t> lastNumbers;
   for (Item* item : lacking) {
     const std::string text = encodable(item->key, alphabet_);

@@ -22,7 +22,7 @@
 namespace tavrel::plist {
 namespace {
 
-// Those from Key to Data hold text.
+// Elements from Key to Data contain text.
 enum class Element : std::uint8_t {
   None,
   Plist,
@@ -38,7 +38,7 @@ enum class Element : std::uint8_t {
   False
 };
 
-// Every element begins and ends with a call: the first letter decides which name is compared.
+// Called at every start and end of an element, so the first letter decides which names to compare.
 Element elementNamed(std::string_view name) {
   const auto either = [name](std::string_view one, Element oneElement, std::string_view other = {},
                              Element otherElement = Element::None) {
@@ -83,7 +83,7 @@ std::string_view trimmed(std::string_view text) {
   return text;
 }
 
-/// Shares the text of keys that come again: the dictionaries of a list mostly have the same keys.
+/// Shares the text of repeated keys: the dictionaries of a list mostly have the same keys.
 class KeyTexts {
  public:
   String of(std::string_view text) {
@@ -100,14 +100,14 @@ class KeyTexts {
   std::array<String, 64> known_;
 };
 
-// Turns Expat's events into values as they come. What a container holds is gathered on one stack,
-// so that a container is made once, with room for just its elements.
+// Turns Expat's events into values as they come. The elements of open containers are gathered on
+// one stack, so that each container is made once, with exactly the room it needs.
 class XmlReader {
  public:
   Expected<Value> read(ByteSpan bytes);
 
-  /// Runs `action` unless the parse has failed. Nothing may be thrown through the parser, which is
-  /// C: an exception ends the parse and is thrown again after it.
+  /// Runs `action` unless the parse has failed. Exceptions must not pass through the parser, which
+  /// is C: one ends the parse, and is rethrown after it.
   template <class Action>
   void guarded(Action action) noexcept {
     if (failed_) return;
@@ -129,7 +129,7 @@ class XmlReader {
  private:
   struct Container {
     Element element;
-    bool hasKey = false;     // a key waits for its value on top of the stack
+    bool hasKey = false;     // a key on top of the stack waits for its value
     std::size_t firstEntry;  // in `entries_`
   };
 

@@ -129,7 +129,7 @@ class XmlWriter {
   }
 
   std::string out_;
-  // Every value takes some bytes, which are limited.
+  // No limit on values: each takes some bytes, and those are limited.
   EncodingGuard guard_{std::numeric_limits<std::size_t>::max()};
   SortedEntries entries_{Alphabet::Xml};
 };

@@ -24,7 +24,7 @@ struct DataFolder {
   std::string_view bundleType;
 };
 
-// A user may replace a folder by a link, and it may lead anywhere.
+// A user may replace a folder with a symbolic link, which may lead anywhere.
 bool hasLink(std::string folder) {
   std::error_code ignored;
   for (const char* const name : {"/.local", "/share", "/applications"}) {

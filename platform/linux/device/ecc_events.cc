@@ -24,11 +24,11 @@ constexpr std::string_view kEventEnding = ".event";
 constexpr std::string_view kErrorEnding = ".errno";
 constexpr mode_t kMode = 0640;
 
-/// Remembered with the counters: their boot, and its number among the boots that were seen.
+/// Stored with the counters: the ID of their boot, and its number among the boots seen so far.
 constexpr std::string_view kBootIDKey = "BootID";
 constexpr std::string_view kBootNumberKey = "BootNumber";
 
-/// The largest number that the kernel uses for an error.
+/// The kernel's largest error number.
 constexpr std::uint64_t kLargestErrorNumber = 4095;
 
 struct CountedError {
@@ -156,7 +156,7 @@ void EccEvents::fill() {
   }
   std::stable_sort(queue_.begin(), queue_.end(),
                    [](const Event& a, const Event& b) { return a.name > b.name; });
-  // An event published again has the name that a run that was cut off gave it.
+  // An event published again has the same name as in the run that was cut off.
   const auto isSame = [](const Event& a, const Event& b) { return a.name == b.name; };
   queue_.erase(std::unique(queue_.begin(), queue_.end(), isSame), queue_.end());
 }
@@ -195,10 +195,10 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
   std::uint64_t boot = lastBoot ? static_cast<std::uint64_t>(lastBoot->int64()) : 0;
   if (!bootID.empty() && counted.string(kBootIDKey) != bootID) {
     ++boot;
-    // Counts without an id predate the memory of boots; they are taken to be of this boot.
+    // Counts without a boot ID, from an earlier version, are taken to be of this boot.
     if (counted.contains(kBootIDKey)) counted = {{kBootNumberKey, boot}};
   }
-  // Orders boots, and keeps boots that were never remembered apart.
+  // The number orders boots; the ID distinguishes boots whose counts were never stored.
   const std::string prefix = bootID.empty() ? "" : format("%010llu-%s-", boot, bootID.substr(0, 8));
   for (const std::string& controller : *controllers) {
     const auto number =
@@ -211,8 +211,8 @@ std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {
       if (!count) continue;
       const auto before = counted.number(file);
       counted.set(file, *count);
-      // A counter that has gone back has started again. The first look finds errors that nobody has
-      // read, and they count as new.
+      // A counter that has gone back has restarted. On the first look, errors counted so far are
+      // new.
       const std::uint64_t last = before ? static_cast<std::uint64_t>(before->int64()) : 0;
       const std::uint64_t fresh = *count >= last ? *count - last : *count;
       if (fresh == 0) continue;

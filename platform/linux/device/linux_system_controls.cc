@@ -12,7 +12,7 @@ namespace {
 
 constexpr std::string_view kControlsPath = "/etc/tavrel/system-controls.plist";
 
-/// The largest number that the kernel uses for an error.
+/// The kernel's largest error number.
 constexpr std::int64_t kLargestControlError = 4095;
 
 SystemControls::Result give(ByteSpan value, MutableByteSpan buffer) {
@@ -21,7 +21,7 @@ SystemControls::Result give(ByteSpan value, MutableByteSpan buffer) {
   return {0, value.size()};
 }
 
-/// Stores the number over the whole buffer, which is longer than a number for records.
+/// Stores the number over the whole buffer, which is longer than a number when a record is read.
 SystemControls::Result give(const plist::Number& number, MutableByteSpan buffer) {
   const std::int64_t value = number.int64();
   const auto word = static_cast<std::uint64_t>(value);

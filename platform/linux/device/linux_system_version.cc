@@ -31,7 +31,7 @@ std::string unquoted(std::string_view text) {
   return value;
 }
 
-/// Callers expect every entry to be a text.
+/// Callers expect every entry to be a string.
 plist::Dictionary stringsOf(const plist::Dictionary& dictionary) {
   auto strings = plist::Dictionary::create(dictionary.size());
   for (const auto& [key, value] : dictionary) {
@@ -109,7 +109,7 @@ plist::Dictionary LinuxSystemVersion::fromOsRelease() {
   const auto number = osReleaseValue(release, "VERSION_ID");
   if (number) version.set(kProductVersionKey, *number);
 
-  // A system without builds of its own counts each kernel as one.
+  // On a system without build IDs, each kernel release counts as a build.
   auto build = osReleaseValue(release, "BUILD_ID");
   utsname kernel{};
   if (!build && uname(&kernel) == 0) {

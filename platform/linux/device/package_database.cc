@@ -31,7 +31,7 @@ struct Paragraph {
     } else if (field == "Architecture") {
       architecture = value;
     } else if (field == "Status") {
-      // "WANTED FLAG STATE": a package on hold, or chosen to be removed, is installed all the same.
+      // "WANTED FLAG STATE": a package on hold or selected for removal is still installed.
       installed = value.substr(value.find_last_of(' ') + 1) == "installed";
     } else if (field == "Priority") {
       base |= value == "required" || value == "important";

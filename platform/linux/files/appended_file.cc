@@ -10,8 +10,8 @@
 namespace tavrel {
 namespace {
 
-/// How far the whole lines of a file reach; -1 with `errno` when it cannot be read. Only zero
-/// bytes, line ends and a line without an end may follow them.
+/// Where the whole lines of a file end; -1 with `errno` when it cannot be read. Only zero bytes,
+/// line ends and a line without an end may follow.
 off_t endOfWholeLines(int descriptor, off_t size) {
   std::array<char, 4096> block;
   off_t lineEnd = 0;  // the end of the current line; 0 when it has none

@@ -46,7 +46,7 @@ Error tooLarge(const std::string& path, std::size_t largest) {
                " bytes; move it away"};
 }
 
-// For a file that is opened without following a link.
+// The error for a file that was opened without following links.
 Error cannotOpen(std::string_view what, const std::string& path) {
   if (errno != ELOOP) return systemError(what, path);
   return Error{"cannot use " + path + ": it is a symbolic link; move it away"};
@@ -119,8 +119,8 @@ Expected<std::optional<std::string>> FileSystem::readIfPresent(const std::string
   const auto size = static_cast<std::uint64_t>(std::max<off_t>(status.st_size, 0));
   if (size > largest) return tooLarge(path, largest);
 
-  // One byte more than the file should have, so that the usual file ends with the first read. The
-  // kernel's own files give no size in advance.
+  // One byte more than the file's size, so that the first read usually reaches the end. The
+  // kernel's own files show no size in advance.
   std::string content;
   std::size_t filled = 0;
   std::size_t room = std::max<std::size_t>(static_cast<std::size_t>(size), 511) + 1;
@@ -193,7 +193,7 @@ Expected<NewFile> FileSystem::create(const std::string& path, mode_t mode) {
     if (fstat(descriptor.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
       removeStaleTemporaries(folder, fresh);
     }
-    // Owner first: giving a file away takes set-user bits from its mode.
+    // Owner first: a change of owner clears the set-user bits of the mode.
     const mode_t withheld = S_IRWXO & ~mode;
     if (const auto former = status(path); former && S_ISREG(former->st_mode)) {
       if ((former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) &&
@@ -294,8 +294,8 @@ Expected<Descriptor> FileSystem::openFolderLock(const std::string& folder) {
   Descriptor lock(openFile(path.c_str(), O_RDWR | O_CREAT | O_NOFOLLOW | kOpenSafely, kLockMode));
   if (lock) return keepFromOthers(std::move(lock), path);
   if (errno != ENOSPC && errno != EDQUOT) return cannotOpen("lock", path);
-  // No room for an empty file, which no other process can make either. What frees room must go on:
-  // the folder itself can be locked, even if others could hinder that.
+  // The disk has no room for an empty file, not for other processes either. Work that frees room
+  // must go on: lock the folder itself, even though others could lock it too.
   Descriptor open(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
   if (!open) return systemError("lock", folder);
   return open;
@@ -308,9 +308,8 @@ Expected<Descriptor> FileSystem::lockFolder(const std::string& folder) {
   return descriptor;
 }
 
-// Whoever can open a file can lock it. Who put it into a folder is trusted with that folder, unless
-// all may write there: the uploader, which has a user of its own, and members of the folder's
-// group.
+// Whoever can open a file can lock it. Users who may create files in the folder are trusted, such
+// as the uploader's own user and members of the folder's group, unless everybody may.
 Expected<Descriptor> FileSystem::keepFromOthers(Descriptor lock, const std::string& path) {
   struct stat found {};
   const auto folder = status(folderOf(path));
@@ -363,7 +362,7 @@ Status FileSystem::flushFolder(const std::string& folder) {
   const Descriptor descriptor(openFile(folder.c_str(), O_RDONLY | O_DIRECTORY, 0));
   if (!descriptor && errno == ENOENT) return Done{};
   if (!descriptor) return systemError("flush the folder", folder);
-  // Some file systems have no flush for folders, and say so.
+  // Some file systems cannot flush folders, and say so with EINVAL.
   if (syncFile(descriptor.get()) != 0 && errno != EINVAL) {
     return systemError("flush the folder", folder);
   }
@@ -396,7 +395,7 @@ void FileSystem::discardTemporaries(const std::string& folder) {
   removeTemporaries(folder, [](const struct stat&) { return true; });
 }
 
-// -- The system's calls -------------------------------------------------------------------------
+// -- System calls -------------------------------------------------------------------------------
 
 int FileSystem::openFile(const char* path, int flags, mode_t mode) {
   int descriptor = -1;

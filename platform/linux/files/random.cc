@@ -11,7 +11,7 @@
 namespace tavrel {
 namespace {
 
-/// When the kernel gives no random bytes, names still differ by process, time and count.
+/// A fallback when the kernel has no random bytes: names still differ by process, time and count.
 void fillDistinct(MutableByteSpan bytes) {
   static std::uint64_t count = 0;
   timespec now{};

@@ -12,11 +12,12 @@ namespace {
 
 constexpr std::string_view kLockPath = "/run/tavrel/fold.lock";
 
-// A fold of many values on slow flash takes minutes. The daily run would report without what waits.
+// A fold of many values on slow flash takes minutes. Without it, the daily run would report too
+// little.
 constexpr LockPatience kPatience{600'000, "it is folding: try again later"};
 
-// Lines that are remembered. Those beyond `limits::kFoldRefusalLines` only to count each once.
-// Those that find no room here count in each fold.
+// The number of remembered lines. Those beyond `limits::kFoldRefusalLines` are remembered only to
+// be counted once; lines beyond this number are counted in each fold.
 constexpr std::size_t kRemembered = 8192;
 
 }  // namespace
@@ -50,7 +51,7 @@ bool FoldNotes::tell(std::string_view line) {
 }
 
 void FoldNotes::mark() {
-  // The kernel's own stamps are too coarse to tell two marks apart.
+  // The kernel's own timestamps are too coarse to distinguish two marks.
   timespec times[2]{};
   clock_gettime(CLOCK_REALTIME, &times[0]);
   times[1] = times[0];

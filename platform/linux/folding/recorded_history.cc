@@ -12,7 +12,7 @@
 namespace tavrel {
 namespace {
 
-// How often to read again when a fold comes in between.
+// How often to read again after a fold has come in between.
 constexpr int kAttempts = 5;
 
 bool isSame(const timespec& a, const timespec& b) {
@@ -23,14 +23,14 @@ bool mayNotRead(const std::string& path) {
   return access(path.c_str(), R_OK) != 0 && errno == EACCES;
 }
 
-/// The values of a row: those in the store, then those that wait.
+/// The values of a row: those in the store, then the waiting ones.
 class JoinedEnumerator final : public BHHistoryDistributionEnumerator {
  public:
   JoinedEnumerator(BHHistoryDistributionEnumerator* stored, const WaitingValues& waiting,
                    const WaitingValues::Series& series)
       : stored_(stored), waiting_(waiting), series_(series) {}
 
-  /// Why values that wait could not be read.
+  /// Why waiting values could not be read.
   const Status& status() const { return status_; }
 
  private:

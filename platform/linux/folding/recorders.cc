@@ -93,7 +93,7 @@ Recorders::Users::const_iterator Recorders::longestPrefixOf(std::string_view key
     --next;
     const std::string_view below = next->first;
     if (rest.starts_with(below)) return next;
-    // A shorter prefix of the key is one of what both have in common.
+    // Any shorter prefix of the key is a prefix of what both have in common.
     const auto difference = std::mismatch(rest.begin(), rest.end(), below.begin(), below.end());
     rest = rest.substr(0, static_cast<std::size_t>(difference.first - rest.begin()));
   }

@@ -29,7 +29,7 @@ void ScalarChanges::add(std::int32_t day, std::string_view key, std::int64_t amo
 }
 
 Status ScalarChanges::giveTo(SqliteBatch& batch) {
-  // All are read before the first is written: the batch writes many at once.
+  // Read all before writing the first: a read in between would make the batch write each one alone.
   for (auto& [name, change] : changes_) {
     if (!change.isSet) {
       const auto value = batch.scalar(name.first, name.second);

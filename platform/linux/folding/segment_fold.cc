@@ -21,7 +21,7 @@
 namespace tavrel {
 namespace {
 
-// What rows and values take in the store, in bytes.
+// Approximate size in the store of a row and of a value, in bytes.
 constexpr std::int64_t kRowBytes = 160;
 constexpr std::int64_t kValueBytes = 12;
 
@@ -32,7 +32,7 @@ struct LessName {
 };
 using SegmentNames = std::set<SegmentName, LessName>;
 
-// What is done with a segment once the store has taken its values.
+// A segment whose values the store takes, and what to do with it after the commit.
 struct FoldedSegment {
   SegmentName name;
   OpenSegment segment;
@@ -42,8 +42,8 @@ struct FoldedSegment {
 
 class FoldRun {
  public:
-  /// `storeBytes`: beyond them the store takes nothing from users other than root.
-  /// `refusedEarlier`: segments that notes tell of and no store has counted.
+  /// `storeBytes`: a store larger than this takes nothing from users other than root.
+  /// `refusedEarlier`: refused segments that are noted but not yet counted in a store.
   FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
           const Recorders& recorders, FoldReport& report, std::int64_t storeBytes,
           std::uint64_t refusedEarlier)
@@ -83,12 +83,12 @@ class FoldRun {
   const BootInstant boot_ = currentBootInstant();
 
   FoldedRows rows_;
-  std::optional<SegmentNames> known_;               // whose positions the store holds
+  std::optional<SegmentNames> known_;               // segments with positions in the store
   std::map<std::uint32_t, std::size_t> positions_;  // of each user
   std::map<std::uint32_t, std::int64_t> positionBytes_;
   SegmentNames found_;
-  std::set<std::uint32_t> unseen_;    // users with segments whose identities are not known
-  std::vector<SegmentName> removed_;  // whose positions would keep new segments waiting
+  std::set<std::uint32_t> unseen_;    // users with segments of unknown identity
+  std::vector<SegmentName> removed_;  // their positions would keep new segments waiting
   std::map<std::uint32_t, std::uint64_t> values_;
   std::set<std::uint32_t> toldUsers_;
   std::size_t next_ = 0;  // in the listing
@@ -114,7 +114,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   do {
     auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
-    // One damaged row must not keep all that programs recorded from the store.
+    // One damaged row must not keep all recorded values out of the store.
     (*batch)->refuseUnwritableSeries();
     Status done = fillBatch(**batch, listing);
     if (done) done = (*batch)->commit();
@@ -183,7 +183,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   OpenSegment& segment = *opening->segment;
   const std::uint32_t owner = segment.entry.owner;
   SegmentReader reader(segment.file.get());
-  // Asked first: what is read after the last writer has gone is all that there is.
+  // Ask first: only what is read after the last writer has gone is complete.
   const bool isWriterGone =
       findSegmentWriter(segment.file.get(), reader.facts()) == SegmentWriter::Gone;
   const auto state = reader.state();
@@ -196,7 +196,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     if (isWriterGone) folded_.push_back({{}, std::move(segment), {}, true});
     return Done{};
   }
-  // Before, its process may not have written them yet.
+  // Read again: at the first read, the process may not have written them yet.
   const SegmentName name{owner, reader.facts().identity};
   if (!found_.insert(name).second) {
     refuse(folder_.refusal(entry.name, "a copy of another segment"));
@@ -231,7 +231,7 @@ bool FoldRun::mustWait(const SegmentName& name) {
   return ++positions_[name.owner] > limits::kSegmentsPerUser;
 }
 
-// The position of a segment may grow from `before` to `most` bytes.
+// Whether the position of a segment may grow from `before` to `most` bytes.
 Expected<bool> FoldRun::hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner,
                                            std::size_t before, std::size_t most) {
   if (most <= before) return true;
@@ -270,7 +270,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     }
     return Done{};
   }
-  // Of a segment that nobody writes to, a mark is left, unless values wait for a date.
+  // A segment without a writer leaves only a mark, unless values wait for a date.
   if (!isWriterGone || !boot_) {
     const auto hasRoom =
         hasRoomForPosition(batch, name.owner, before.size(), reader.positionBytes());
@@ -308,14 +308,14 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   values_[name.owner] += intake.values();
   counts_.refused += intake.refused() + progress.refused;
   counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
-  // A program that dropped values learns that there may be room again.
+  // The acknowledgement tells a program that dropped values that there may be room again.
   if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
     folded_.push_back({name, std::move(segment), std::move(progress), isOver});
   }
   return Done{};
 }
 
-// Of segments that an earlier fold removed, or that went with the memory that held them.
+// Removes the positions of segments that an earlier fold removed or that a restart has erased.
 Status FoldRun::dropPositions(SqliteBatch& batch) {
   for (const SegmentName& name : *known_) {
     if (found_.contains(name) || unseen_.contains(name.owner)) continue;
@@ -335,7 +335,7 @@ void FoldRun::finishSegments() {
       }
       continue;
     }
-    // What cannot be given back now is given back by the next fold.
+    // Space that cannot be given back now is given back by the next fold.
     if (const Descriptor file = folder_.openToAcknowledge(folded.segment)) {
       static_cast<void>(acknowledge(file.get(), folded.progress));
     }
@@ -358,7 +358,8 @@ Status foldAll(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes
   FoldRun fold(folder, store, notes, recorders, report, storeBytes, 0);
   Status done = fold.run(listing);
   if (!fold.hasReplacedStore()) return done;
-  // The new store knows no positions, and what earlier transactions took is lost with the other.
+  // The new store has no positions, and the values of earlier transactions are lost with the old
+  // one.
   report.waiting = 0;
   return FoldRun(folder, store, notes, recorders, report, storeBytes, fold.refusedSegments())
       .run(listing);
@@ -388,7 +389,7 @@ FoldReport SegmentFold::run() {
     report.failure = listing.error().message;
   } else if (!listing->segments.empty() || !listing->refusals.empty()) {
     const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
-    // While the file of limits has a fault, nobody knows what the store may hold.
+    // While the limits file has a fault, the bound of the store is unknown.
     const auto bounds = DeviceLimits::read(root_, files_, propertyLists_);
     const std::int64_t most = bounds
                                   ? bounds->of(Kept::Store).bytes / 100 * limits::kFoldStorePercent

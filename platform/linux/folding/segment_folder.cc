@@ -28,7 +28,7 @@ struct CloseFolder {
   void operator()(DIR* folder) const { closedir(folder); }
 };
 
-// Whether opening a file failed for a reason that lies outside of it.
+// Whether opening a file failed for a reason other than the file itself.
 bool isSystemsFailure(int code) {
   return code == EMFILE || code == ENFILE || code == ENOMEM || code == EIO;
 }
@@ -39,7 +39,7 @@ std::string_view adviceFor(int code) {
                                          : "the next fold tries again";
 }
 
-// Why a file is no segment, judged from outside; nothing for one that may be.
+// Why a file cannot be a segment, judged by its status; null when it can.
 const char* faultOf(const struct stat& status, dev_t device) {
   if (S_ISLNK(status.st_mode)) return "a symbolic link";
   if (!S_ISREG(status.st_mode)) return "not a regular file";
@@ -48,7 +48,7 @@ const char* faultOf(const struct stat& status, dev_t device) {
   return nullptr;
 }
 
-/// A random choice of at most `most` out of all that are offered.
+/// A random choice of at most `most` of the elements offered.
 template <class Element>
 class Sample {
  public:
@@ -114,7 +114,7 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
     const std::string_view name = entry->d_name;
     if (name == "." || name == ".." || name == kRequest) continue;
     if (++entries > mostFiles) {
-      // First, because only some lines are logged.
+      // At the front, because only the first lines are logged.
       listing.refusals.insert(listing.refusals.begin(),
                               path_ + " has more than " + std::to_string(mostFiles) +
                                   " files: the rest is not folded; remove files that are not "
@@ -173,7 +173,7 @@ Expected<SegmentOpening> SegmentFolder::openSegment(const SegmentEntry& entry) c
     return refuse("it cannot be examined: " + std::generic_category().message(errno),
                   adviceFor(errno));
   }
-  // Removed since it was listed.
+  // The segment was removed after it was listed.
   if (status.st_nlink == 0) return SegmentOpening();
   if (const char* const fault = faultOf(status, device_)) return refuse(fault);
   segment.entry.owner = status.st_uid;
@@ -215,8 +215,8 @@ std::string SegmentFolder::refusal(std::string_view name, std::string_view reaso
 
 Status SegmentFolder::clearRequest() const {
   if (unlinkat(folder_.get(), kRequest, 0) == 0 || errno == ENOENT) return Done{};
-  // Anybody may make a folder of that name. One with something in it gets another name, under which
-  // it is refused as other files are: as a request it would have folds follow each other for ever.
+  // Anybody can make a folder of that name. A folder that is not empty is renamed, and then refused
+  // as other files are: as a request it would trigger one fold after another for ever.
   const int code = errno;
   if (unlinkat(folder_.get(), kRequest, AT_REMOVEDIR) == 0) return Done{};
   const std::string aside = std::string(kRequest) + "-" + randomName();

@@ -7,15 +7,15 @@
 namespace tavrel {
 namespace {
 
-// 9999-12-31, the last day that has a date of the usual form. A clock that was set forward may have
-// shown any day before.
+// 9999-12-31, the last day with a four-digit year. A clock that was set forward may have shown any
+// earlier day.
 constexpr std::int32_t kLastDay = 2'932'896;
 
 }  // namespace
 
 FoldedRows::Row* FoldedRows::find(std::uint32_t user, std::int32_t day, std::string_view key,
                                   bool isScalar) {
-  // An odd factor keeps the days of one key apart, and its kinds.
+  // The odd factor keeps a key's days and its two kinds apart.
   const std::uint64_t name =
       keyedHash(key) + (std::uint64_t{static_cast<std::uint32_t>(day)} * 2 + (isScalar ? 1 : 0)) *
                            0x9E3779B97F4A7C15U;

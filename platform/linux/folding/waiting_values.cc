@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// Passes on what is selected.
+// Passes the selected values on.
 class SelectingSink final : public SegmentSink {
  public:
   SelectingSink(const RowSelection& selection, SegmentIntake& intake)
@@ -74,7 +74,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
     }
     const auto opening = folder.openSegment(entry);
     if (!opening) return opening.error();
-    // The fold tells what is refused.
+    // The next fold logs the refusal.
     if (!opening->segment) continue;
     if (Status added = waiting.add(*opening->segment, recorders, history, selection, rows, buffer);
         !added) {
@@ -88,7 +88,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
                           SqliteHistory* history, const RowSelection& selection, FoldedRows& rows,
                           PendingDistributions& buffer) {
   SegmentReader reader(segment.file.get());
-  // A lease could be in the way of a fold.
+  // No lease here: it could disturb a fold.
   const bool isWriterGone = findSegmentProcess(reader.facts()) == SegmentWriter::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;

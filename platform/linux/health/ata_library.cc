@@ -6,7 +6,7 @@
 namespace tavrel::health {
 namespace {
 
-// The name that a linked program would load. It has the interface of the header.
+// The name that a linked program would load; it guarantees the interface of the header.
 constexpr const char* kFile = "libatasmart.so.4";
 
 template <class Function>

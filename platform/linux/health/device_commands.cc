@@ -19,7 +19,7 @@ namespace {
 
 constexpr std::uint8_t kGetLogPage = 0x02;
 constexpr std::uint32_t kAllNamespaces = 0xFFFFFFFF;
-// Without this bit the read clears an event that waits for somebody else.
+// Without this bit, the read would clear an event that another reader waits for.
 constexpr std::uint32_t kRetainEvent = 1U << 15;
 constexpr std::uint32_t kMilliseconds = 5'000;
 

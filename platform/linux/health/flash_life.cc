@@ -30,7 +30,7 @@ constexpr std::size_t kRevision = 192, kPreEolOffset = 267;
 constexpr std::uint8_t kRevisionOf50 = 7;
 constexpr unsigned kLastStep = 11, kLastPreEol = 3;
 
-// The next hexadecimal number of `text`, which is cut after it.
+// Takes the next hexadecimal number from the beginning of `text`.
 std::optional<unsigned> takeNumber(std::string_view& text) {
   text = trimmed(text);
   if (text.starts_with("0x") || text.starts_with("0X")) text.remove_prefix(2);
@@ -46,7 +46,7 @@ std::optional<unsigned> numberOf(std::optional<std::string_view> text) {
   return text ? takeNumber(*text) : std::nullopt;
 }
 
-// 0 is "not defined", and what lies beyond the scale is reserved.
+// 0 means "not defined", and values beyond the scale are reserved.
 Figures figuresOf(std::span<const FigureKind, 3> kinds, std::optional<unsigned> a,
                   std::optional<unsigned> b, std::optional<unsigned> preEol) {
   Figures figures;

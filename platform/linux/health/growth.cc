@@ -13,7 +13,7 @@ using Counters = std::map<std::string, std::int64_t, std::less<>>;
 
 constexpr std::int64_t kMemoryVersion = 1;
 
-// What a counter has grown by since `last`; nothing when that cannot be known.
+// The growth of a counter since `last`; nothing when that cannot be known.
 std::optional<std::int64_t> step(const Figure& figure, std::int64_t last, bool isSameBoot) {
   if (figure.kind->course == Course::Attached && (!isSameBoot || figure.value < last)) {
     return figure.value;

@@ -196,7 +196,7 @@ constexpr FigureKind kOcp[] = {
      "log C0h bytes 136-143",
      "commands that were not aligned",
      {136, 8}},
-    // From here on: version 2 of the log.
+    // From here on: only in version 2 of the log.
     {"backup_power_starts",
      kEvents,
      kLifetime,

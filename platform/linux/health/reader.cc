@@ -18,7 +18,8 @@
 namespace tavrel::health {
 namespace {
 
-// By what a drive is known again. A digest, so that the file of memories has no serial number.
+// Identifies a drive from one reading to the next. A digest, so that the memory file contains no
+// serial number.
 std::string identityOf(const Drive& drive) {
   const std::string& known = drive.serial.empty() ? drive.name : drive.serial;
   std::string identity;
@@ -81,7 +82,7 @@ void HealthReader::readNvme(const Drive& drive, Memory& memory, Reading& reading
   if (!page) return;
   const std::string key = drive.model + '/' + drive.firmware;
   const auto known = memory.hasOcpLog.find(key);
-  // A drive that lacks the log counts each question among its errors.
+  // A drive that lacks the log counts each request for it as an error.
   if (known != memory.hasOcpLog.end() && !known->second) return;
   const auto ocpPage = commands_.nvmeLog(drive.deviceFile, kNvmeOcpLog);
   const auto ocp = ocpPage ? nvmeOcpFigures(*ocpPage) : ocpPage.error();
@@ -107,7 +108,7 @@ Reading HealthReader::readDrive(const Drive& drive, Memory& memory, bool& isDriv
       const auto extCsd = commands_.extCsd(drive.deviceFile);
       take(extCsd ? emmcFigures(*extCsd) : extCsd.error(), "EXT_CSD, from the card", reading);
     }
-    // A card that may not be asked still has what the kernel read.
+    // Without permission to ask the card, use what the kernel has read from it.
     if (reading.from.empty()) reading = readWithoutCommands(drive);
   }
   return reading;
@@ -124,8 +125,8 @@ Memory HealthReader::loadMemory() {
   return {};
 }
 
-// Growth counts from the reading that the last daily run saw, so the daemon's note of its last run
-// says when to start again.
+// Growth counts from the reading that the last daily run saw, so it restarts when the daemon's last
+// run day changes.
 std::optional<std::int64_t> HealthReader::lastRunDay() {
   const std::string path =
       root_.path(format("/var/mobile/Library/Preferences/%s.plist", kTavrelDomain));
@@ -181,8 +182,8 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
       log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
     } else {
       reading.growth = takeGrowth(memory.drives[identityOf(drive)], reading.figures, moment);
-      // Kept before anybody sees the growth, which the next run would have again otherwise: the
-      // next drive may be one that never answers.
+      // Store the memory before anybody sees the growth, or the next run would count it again: the
+      // next drive may never answer.
       if (!keep(memory)) {
         reading.growth.clear();
         isDone = false;
@@ -190,7 +191,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
     }
     isDone = write(reading) && isDone;
   }
-  // Last, because a drive that was read is not old, whatever the clock showed before.
+  // Last, because a drive that was just read is not old, whatever the clock showed before.
   if (memory.forgetOld(moment.seconds)) isDone = keep(memory) && isDone;
   return removeGone(drives) && isDone;
 }

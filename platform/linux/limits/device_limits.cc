@@ -40,7 +40,7 @@ std::string kindNames() {
 Status applyBound(std::int64_t& bound, const plist::Value& value, Range range,
                   const std::string& place) {
   const auto number = value.number();
-  // An integer beyond 64 bits reads as a negative one.
+  // An integer above 2^63-1 reads as negative.
   if (!number || number->isFloating() || number->int64() < range.lowest ||
       number->int64() > range.highest) {
     return Error{

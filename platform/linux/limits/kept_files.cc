@@ -80,7 +80,7 @@ Expected<KeptFiles> KeptFiles::list(Kept kind, const DeviceRoot& root, FileSyste
   return kept;
 }
 
-// A file that is gone, or is none, does not count.
+// A file that has gone, or is not a regular file, does not count.
 void KeptFiles::add(const std::string& path, std::int64_t seconds) {
   const auto status = FileSystem::status(path);
   if (!status || !S_ISREG(status->st_mode)) return;
@@ -169,7 +169,7 @@ bool KeptFiles::stays(std::size_t index) const {
 
 TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
   removeOrphans(now);
-  // Files of one day follow each other, so a day has gone when the next file is of another.
+  // Files of one day are adjacent, so a day has gone once the next file is of another day.
   KeptUse left = use();
   std::size_t count = 0;
   while (count < list_.size() && (left.days > bounds.days || left.bytes > bounds.bytes) &&
@@ -179,14 +179,14 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
     if (++count == list_.size() || list_[count].day() != file.day()) --left.days;
   }
   if (count == 0) return {};
-  // A run that hands out events holds the same lock.
+  // The same lock as for a run that hands out events.
   Expected<Descriptor> lock = Descriptor();
   if (kind_ == Kept::EccEvents) lock = fileSystem_.lockFolder(folder_);
   if (!lock) return {0, lock.error()};
   return removeFirst(count);
 }
 
-// As long as a log can be seen, also after a power cut, its metadata can.
+// Logs before their metadata: while a log exists, even after a power cut, its metadata does too.
 TrimmedFiles KeptFiles::removeFirst(std::size_t count) {
   TrimmedFiles trimmed;
   std::size_t gone = 0;
@@ -200,7 +200,7 @@ TrimmedFiles KeptFiles::removeFirst(std::size_t count) {
     trimmed.status = flushed;
     return trimmed;
   }
-  // One that cannot be removed now is removed as an orphan later.
+  // Metadata that cannot be removed now is removed as an orphan later.
   for (std::size_t i = 0; i < gone; ++i)
     fileSystem_.discard(list_[i].companion);
   return trimmed;

@@ -8,13 +8,13 @@
 namespace tavrel {
 namespace {
 
-// Free bytes that stay in the store's file, for the days to come: moving pages to shorten it by a
-// day's worth, only for the next day to lengthen it again, would wear the flash. Some two days, of
-// the bound at most this part.
+// Free space that stays in the store's file for coming days: shortening it by a day's worth, only
+// for the next day to extend it again, would wear the flash. About two days' worth, and at most
+// this fraction of the bound.
 constexpr std::int64_t kReserveDays = 2;
 constexpr std::int64_t kLargestReservePart = 8;
 
-// The first that exists holds the lock under which one process tidies at a time.
+// The first of these that exists holds the lock that lets one process tidy at a time.
 constexpr std::string_view kLockFolders[] = {"/run/tavrel", "/var/lib/tavrel", "/var/mobile"};
 
 std::int64_t reserveOf(std::int64_t bytesInUse, std::int64_t days, const Bounds& bounds) {
@@ -37,7 +37,7 @@ void Tidy::trim(TidyReport& report) {
   Expected<Descriptor> lock = Descriptor();
   const auto* const folder = std::ranges::find_if(
       kLockFolders, [&](auto path) { return FileSystem::status(root_.path(path)).has_value(); });
-  // Where there is none, there is nothing to remove.
+  // Without such a folder, there is nothing to remove.
   if (folder != std::end(kLockFolders)) lock = files_.lockFolder(root_.path(*folder));
   if (!lock) return report.failures.push_back(lock.error().message);
   const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
@@ -60,7 +60,7 @@ void Tidy::trim(TidyReport& report) {
   count(report, report.failures);
 }
 
-// Where nothing can be written, the caller's own lines remain.
+// When the file cannot be written, the caller still reports the failures.
 void Tidy::remember(const TidyReport& report) {
   const std::string path = root_.path(kTidyFailuresFile);
   std::string lines;
@@ -70,9 +70,9 @@ void Tidy::remember(const TidyReport& report) {
   static_cast<void>(files_.replace(path, asBytes(lines), 0644));
 }
 
-// Days that were recorded while the clock was ahead, then the oldest. Without the days that wait to
-// be reported: today, yesterday before its run, and the two after the last run, which they were
-// before a clock went wrong.
+// Days recorded while the clock was ahead, then the oldest. Days that wait to be reported are left
+// out: today, yesterday until its run, and the two days after the last run, which were today and
+// yesterday before a clock went wrong.
 std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& days) {
   const std::int64_t today = store_.BHDaysSince1970();
   bool hasRun = false;
@@ -118,7 +118,7 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
   if (!given) fail(given.error());
 }
 
-// The values are committed, or kept beside the store when there is no room.
+// The counts are committed, or kept beside the store when there is no room.
 void Tidy::count(const TidyReport& report, std::vector<std::string>& failures) {
   const std::int32_t today = store_.BHDaysSince1970();
   bool hasCounted = false;

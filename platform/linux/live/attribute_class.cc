@@ -21,7 +21,7 @@ std::string lineOf(const std::string& path, TextBuffer& buffer) {
   return text ? std::string(takeLine(*text)) : std::string();
 }
 
-// Reading a drive's sensor would wake the drive.
+// Files with the device's power state: reading the sensor of a sleeping drive would wake it.
 std::vector<std::string> powerStatusOf(const std::string& path) {
   std::vector<std::string> files;
   for (const char* const file :
@@ -102,7 +102,7 @@ void addAttributes(const std::string& path, const Place& place, const std::strin
       if (exists(file)) add(attribute, file, {}, powerStatus);
       continue;
     }
-    // Names are sorted, so the ones that fit stand together.
+    // Names are sorted, so matching ones are adjacent.
     const std::string_view head = attribute.file.substr(0, attribute.file.find('*'));
     auto name = std::lower_bound(names.begin(), names.end(), head);
     for (; name != names.end() && name->starts_with(head); ++name) {

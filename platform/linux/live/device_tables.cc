@@ -110,7 +110,7 @@ constexpr Attribute kSuspend[] = {
     {"max_hw_sleep", "suspend.longest_hw_sleep", kMicroseconds},
 };
 
-// class, name, group; folder, beginning of its entries, file with the name, always with the device
+// class, name, group; folder, prefix of its entries, file with the name, always with the device
 constexpr DeviceClass kClasses[] = {
     {"LinuxThermal", "thermal", "Thermal", "/sys/class/thermal", "thermal_zone", "type", false,
      Speed::Slow, kThermalZone},

@@ -1,4 +1,4 @@
-// The health of drives, from the readings that tavrel-health leaves. No drive is asked.
+// The health of drives, from the readings that tavrel-health stores. Sends no command to a drive.
 
 #include <algorithm>
 #include <array>
@@ -20,7 +20,7 @@
 namespace tavrel::live {
 namespace {
 
-// Figures worth a scalar a day: states of a drive as they stand, of counters the growth alone.
+// Figures worth a scalar a day: the states of a drive, and of counters only the growth.
 constexpr auto kDailyFigures = std::to_array<std::string_view>({
     "bad_blocks",
     "bad_sectors",
@@ -49,7 +49,7 @@ constexpr auto kDailyFigures = std::to_array<std::string_view>({
 });
 static_assert(std::ranges::is_sorted(kDailyFigures));
 
-// Figures of the readings that hold now.
+// Figures of the readings that are still valid.
 std::vector<health::NamedFigure> figuresNow(const DeviceRoot& root) {
   FileSystem files;
   std::vector<health::Reading> readings = health::loadReadings(root, files).readings;

@@ -4,7 +4,7 @@
 //    1:          9          0  IO-APIC   1-edge      i8042
 //  NMI:          0          0  Non-maskable interrupts
 //
-// The columns are the processors that run now; the heading tells which.
+// The columns are the processors that are online now; the heading names them.
 #include <algorithm>
 #include <memory>
 #include <string>
@@ -67,7 +67,7 @@ class InterruptReader final : public TextReader {
     rows_.emplace(std::move(key), firstSlot);
   }
 
-  // Rows that share their slots add up.
+  // Rows that share slots add up.
   void read(std::string_view text, std::span<std::int64_t> slots) const override {
     const std::vector<std::uint32_t> processors = processorsIn(takeLine(text));
     while (!text.empty()) {

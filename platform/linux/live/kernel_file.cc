@@ -14,11 +14,12 @@ namespace tavrel::live {
 namespace {
 
 constexpr std::size_t kFirstBytes = 16U << 10;
-constexpr std::size_t kLeastRoom = 4096;  // the kernel gives no more of an attribute
+constexpr std::size_t kLeastRoom = 4096;  // an attribute has at most one page
 constexpr std::size_t kFallbackDescriptors = 256;
 
 Descriptor openFile(const std::string& path) {
-  // Without waiting: in a folder that stands in for the kernel's, anything may have the name.
+  // Non-blocking: in a folder that stands in for the kernel's, the file may be anything, even a
+  // FIFO.
   return Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY | O_NONBLOCK));
 }
 
@@ -66,7 +67,7 @@ std::optional<std::string_view> readKernelFile(const std::string& path, ReadMode
 std::optional<std::string_view> KernelFile::read(DescriptorBudget& budget, TextBuffer& buffer) {
   if (descriptor_) {
     const auto text = readOpen(descriptor_.get(), mode_, buffer);
-    // The file of a device that is gone fails; one of that name may belong to the next device.
+    // Reads fail once the device has gone; a new file with this name may belong to its successor.
     if (text || errno != ENODEV) return text;
     descriptor_.reset();
     budget.giveBack();

@@ -19,7 +19,7 @@ constexpr bool isPrintable(char c) {
   return c > ' ' && c <= '~';
 }
 
-// FNV-1a. Ids must not differ from process to process.
+// FNV-1a, without a random key: IDs must be the same in all processes.
 std::uint64_t hashOf(std::string_view text) {
   std::uint64_t hash = 0xcbf29ce484222325;
   for (const char c : text) {

@@ -52,7 +52,7 @@ struct ChannelKey {
   bool operator==(const ChannelKey&) const = default;
 };
 struct ChannelKeyHash {
-  // Both are hashes already.
+  // Both IDs are hashes already.
   std::size_t operator()(const ChannelKey& key) const { return key.driverID ^ key.channelID; }
 };
 struct ChannelPlace {
@@ -60,7 +60,7 @@ struct ChannelPlace {
   const LiveChannel* channel;
 };
 
-// The kernel's time base of a recording: nanoseconds since boot, without suspended time.
+// The time base of element timestamps: nanoseconds since boot, without suspended time.
 std::uint64_t nowInTicks() {
   timespec now{};
   clock_gettime(CLOCK_MONOTONIC, &now);
@@ -99,8 +99,8 @@ class LiveMachine::State {
     return at == index_.end() ? nullptr : &at->second;
   }
 
-  /// Reads the files marked in `wanted`, which has a list for each source: those of slow devices
-  /// last, all of them together. A source without any mark is left alone.
+  /// Reads the files marked in `wanted`, which has a list for each source; those of slow devices
+  /// come last, all together. A source without a mark is skipped.
   void read(const std::vector<std::vector<bool>>& wanted) {
     std::vector<std::pair<std::size_t, std::size_t>> slow;
     std::vector<std::shared_ptr<SlowFile>> slowFiles;
@@ -140,7 +140,7 @@ class LiveMachine::State {
         }
         continue;
       }
-      // Two tables in one text stand one after the other.
+      // Successive files with the same path are tables of one text, which is read once.
       if (!textPath || *textPath != files[i].file.path()) {
         text = files[i].file.read(budget_, buffer_);
         textPath = &files[i].file.path();
@@ -185,7 +185,7 @@ class LiveMachine::Sampling final : public LiveSampling {
     if (!place) return 0;
     LiveSource& source = state_->sources()[place->source];
     std::vector<bool>& wanted = wanted_[place->source];
-    // One flag more than files, so that a source without files is wanted, too.
+    // One flag more than there are files, so that a source without files can be wanted too.
     if (wanted.empty()) wanted.resize(source.files().size() + 1);
     source.want(*place->channel, wanted);
     places_.push_back(*place);
@@ -237,7 +237,7 @@ class LiveMachine::Sampling final : public LiveSampling {
 
  private:
   const std::shared_ptr<State> state_;
-  std::vector<std::vector<bool>> wanted_;  // for each source, of its files
+  std::vector<std::vector<bool>> wanted_;  // for each source, a flag per file
   std::vector<ChannelPlace> places_;
   std::uint64_t ticks_ = 0;
 };

@@ -8,7 +8,7 @@
 namespace tavrel::live {
 namespace {
 
-constexpr std::uint32_t kArrayValues = 4;  // of one element
+constexpr std::uint32_t kArrayValues = 4;  // values per element
 
 }  // namespace
 
@@ -41,7 +41,7 @@ std::uint32_t LiveSource::addMeasured(std::uint32_t slots,
 }
 
 void LiveSource::add(const Place& place, LiveChannel channel) {
-  // A second one of a name, as two sensors with one label, gets a name of its own.
+  // A second channel with the same name, as from two sensors with one label, gets a number.
   std::string name = channel.name;
   const auto idOf = [&](const std::string& text) {
     return stableID(std::string(place.group) + '\n' + std::string(place.subGroup) + '\n' + text);
@@ -49,7 +49,7 @@ void LiveSource::add(const Place& place, LiveChannel channel) {
   for (int number = 2; !ids_.insert(channel.id = idOf(name)).second; ++number)
     name = channel.name + '#' + std::to_string(number);
   channel.name = std::move(name);
-  // Entries of one subgroup come together, so the group is among the last.
+  // Channels of one subgroup are added together, so their group is among the last.
   for (std::size_t i = groups_.size(); i-- > 0;) {
     if (groups_[i].group != place.group || groups_[i].subGroup != place.subGroup) break;
     if (groups_[i].unit == place.unit) return groups_[i].channels.push_back(std::move(channel));

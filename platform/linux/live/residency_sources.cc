@@ -21,7 +21,7 @@ std::string lineOf(const std::string& path) {
   return text ? std::string(takeLine(*text)) : std::string();
 }
 
-// The keys of the rows that begin with a number, in their order.
+// The keys of the rows that begin with a number, in order.
 std::vector<std::string> numberedRows(const std::string& path, const TableForm& form) {
   TextBuffer buffer;
   auto text = readKernelFile(path, ReadMode::Once, buffer);
@@ -54,14 +54,14 @@ std::unique_ptr<TableReader> timeReader(const std::vector<std::string>& states,
   return reader;
 }
 
-// A device with a text of times, one of transitions, and a file that tells the current state.
+// A device with a text of times, a text of transitions, and a file with the current state.
 struct StateTable {
   std::string times;
   std::string transitions;
   std::string current;
   Speed currentSpeed;
   TableForm form;
-  bool timeIsLast;  // behind the transitions in their own row, rather than behind the state
+  bool timeIsLast;  // the time follows a row's transitions, not the state
   Scale scale;
   std::string (*nameOf)(std::int64_t number);
 };

@@ -56,7 +56,7 @@ void SlowReads::work(const std::shared_ptr<Round>& round) {
       auto text = readSlowly(*file);
       lock.lock();
       file->isWaitedFor = false;
-      if (round->isOver) return;  // and its texts are no longer there
+      if (round->isOver) return;  // and its texts have been taken
       round->texts[index] = std::move(text);
     }
     round->isDone[index] = true;
@@ -80,7 +80,7 @@ std::vector<std::optional<std::string>> SlowReads::read(
   int threads = 0;
   std::unique_lock lock(*mutex_);
   while (round->done < count && Clock::now() < end) {
-    // For a turn nothing has come: the threads before wait for sensors.
+    // Nothing came for a whole turn: the earlier threads wait for sensors.
     if (round->next == count || threads++ == limits::kWaitingSensors) break;
     if (!startThread(round)) break;
     std::size_t seen = SIZE_MAX;

@@ -1,4 +1,4 @@
-// Sources that count or ask: the boot, and the file systems that are mounted.
+// Sources that count files or make system calls: the boot, and the mounted file systems.
 #include <linux/magic.h>
 #include <string>
 #include <sys/stat.h>
@@ -23,7 +23,7 @@ bool isMountPoint(const std::string& folder, const std::string& parent) {
          inner.st_dev != outer.st_dev;
 }
 
-// What the kernel left behind when it crashed. A folder that is not mounted looks empty, too.
+// Records that the kernel left when it crashed. A folder that is not mounted looks empty, too.
 std::int64_t crashRecords(const std::string& folder, const std::string& parent) {
   std::int64_t count = 0;
   for (const std::string& name : namesIn(folder))
@@ -32,7 +32,7 @@ std::int64_t crashRecords(const std::string& folder, const std::string& parent) 
   return isMountPoint(folder, parent) && access(folder.c_str(), R_OK) == 0 ? 0 : kUnset;
 }
 
-// "\040" in a path of the list of mounts stands for a blank.
+// The list of mounts escapes characters in octal: "\040" is a blank.
 std::string unescaped(std::string_view text) {
   std::string path;
   const auto isOctal = [](char c) { return c >= '0' && c <= '7'; };
@@ -49,7 +49,7 @@ std::string unescaped(std::string_view text) {
   return path;
 }
 
-// Only file systems on disks of this machine: others may keep the reader waiting.
+// Only file systems on this machine's disks: others may keep the reader waiting.
 bool isLocal(std::string_view device, std::string_view type) {
   return (device.starts_with("/dev/") || device.starts_with("ubi")) && !type.starts_with("fuse");
 }
@@ -71,7 +71,7 @@ void measureFileSystem(const std::string& mountPoint, std::span<std::int64_t> sl
   const double used = static_cast<double>(slots[kUsed]);
   const double usable = used + static_cast<double>(slots[kAvailable]);
   if (usable > 0) slots[kUsedPercent] = static_cast<std::int64_t>(100 * used / usable);
-  // Some file systems make the records of their files as they need them.
+  // Some file systems allocate inodes on demand and have no total.
   if (status.f_files == 0) return;
   slots[kFiles] = inBytes(status.f_files, 1);
   slots[kFilesFree] = inBytes(status.f_ffree, 1);
@@ -91,7 +91,7 @@ void addBoot(const DeviceRoot& root, LiveSource& source) {
   source.addSimple({"Boot", "", kEvents}, "boot.crash_records", slot, kDailyCategory);
 }
 
-// Sizes come from the file systems themselves, so a copied list of mounts has none.
+// Sizes come from the mounted file systems themselves, so a copied list of mounts is useless.
 void addFileSystems(const DeviceRoot& root, LiveSource& source) {
   struct statfs status {};
   if (statfs(root.path("/proc").c_str(), &status) != 0) return;

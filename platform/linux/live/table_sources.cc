@@ -38,12 +38,12 @@ constexpr Column kDisk[] = {
     {19, "flush_time", kMilliseconds},
 };
 
-// Interfaces of the machine, also for a process that has a network of its own; and, where process 1
-// is hidden, those of the reader.
+// The machine's interfaces, even for a process in another network namespace; the reader's own when
+// process 1 is hidden.
 constexpr std::string_view kMachineInterfaces = "/proc/1/net/dev";
 constexpr std::string_view kOwnInterfaces = "/proc/net/dev";
 
-// Tokens of a line of interfaces: 0 is the name.
+// Tokens of an interface's line: 0 is the name.
 constexpr Column kInterface[] = {
     {1, "rx_bytes", kBytes, {}, {"net.rx_bytes"}},
     {2, "rx_packets", kPackets},
@@ -88,14 +88,14 @@ constexpr Figure kAllProcessors[] = {
     {"procs_blocked", 1, "cpu.blocked", kPlain},
 };
 
-// Tokens of a processor's line in /proc/schedstat; the first six behind its name are of the past.
+// Tokens of a processor's line in /proc/schedstat; the first six after its name are obsolete.
 constexpr Column kRunQueue[] = {
     {7, "sched_run", kNanoseconds},
     {8, "sched_wait", kNanoseconds},
     {9, "sched_slices", kEvents},
 };
 
-constexpr Scale kPageScale{0, 1};  // stands for the size of a page
+constexpr Scale kPageScale{0, 1};  // replaced by the page size
 
 constexpr Figure kVmStatistics[] = {
     {"pgpgin", 1, "memory.paged_in", kBytes, kPerKibibyte},
@@ -178,7 +178,7 @@ constexpr Figure kGroupEvents[] = {
     {"oom", 1, "memory_oom", kEvents},
     {"oom_kill", 1, "memory_oom_kills", kEvents},
 };
-// "8:0 rbytes=1 wbytes=2 rios=3 wios=4 dbytes=5 dios=6" for each disk, whose figures add up.
+// "8:0 rbytes=1 wbytes=2 rios=3 wios=4 dbytes=5 dios=6" per disk; the figures of all disks add up.
 constexpr Figure kGroupIo[] = {
     {"", 3, "io_read_bytes", kBytes},
     {"", 5, "io_written_bytes", kBytes},
@@ -279,7 +279,7 @@ void addSwapDevices(const DeviceRoot& root, LiveSource& source) {
   }
 }
 
-// The slices right below the root of the unified hierarchy.
+// The top-level slices of the unified hierarchy.
 void addControlGroups(const DeviceRoot& root, LiveSource& source) {
   const bool isUnified = exists(root.path("/sys/fs/cgroup/cgroup.controllers"));
   const char* const folder = isUnified ? "/sys/fs/cgroup" : "/sys/fs/cgroup/unified";

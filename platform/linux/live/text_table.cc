@@ -24,7 +24,7 @@ void skipHeadings(std::string_view& text, const TableForm& form) {
     takeLine(text);
 }
 
-/// Calls back with key and number of tokens of each row.
+/// Calls back with the key and the number of tokens of each row.
 template <class Callback>
 void forEachRow(std::string_view text, const TableForm& form, const Callback& callback) {
   skipHeadings(text, form);
@@ -101,7 +101,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   std::unordered_set<std::string> allowed;
   if (!table.only.empty()) {
     for (std::string& name : namesIn(root.path(table.only))) {
-      std::replace(name.begin(), name.end(), '!', '/');  // as sysfs writes them in names
+      std::replace(name.begin(), name.end(), '!', '/');  // sysfs writes '/' as '!' in names
       allowed.insert(std::move(name));
     }
   }
@@ -156,7 +156,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
   std::unordered_map<std::string, std::size_t> tokens;
   forEachRow(*text, list.form,
              [&](std::string_view key, std::size_t count) { tokens.emplace(key, count); });
-  // The rows may have different figures, so each token that is listed has a column.
+  // Rows may have different figures, so the table has a column for each listed token and scale.
   std::vector<std::pair<std::size_t, Scale>> columns;
   for (const Figure& figure : list.figures)
     columns.emplace_back(figure.token, figure.scale);

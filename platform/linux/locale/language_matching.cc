@@ -17,7 +17,7 @@
 namespace tavrel {
 namespace {
 
-/// The properties by which a preferred language is compared, computed once.
+/// A preferred language, with the properties that comparisons need, computed once.
 struct Wish {
   explicit Wish(LanguageTag wanted)
       : tag(std::move(wanted)),
@@ -25,7 +25,7 @@ struct Wish {
         homeRegion(language_tables::homeRegion(tag.language, script)),
         parents(language_tables::parentRegions(tag.language, script, tag.region)) {}
 
-  /// How well `offer` suits, 0 being best; nothing when it does not.
+  /// How well `offer` suits, 0 for best; nothing when it does not suit.
   std::optional<int> rank(const LanguageTag& offer) const {
     if (offer.language != tag.language || offer.effectiveScript() != script) return std::nullopt;
     if (offer.region == tag.region && offer.variant == tag.variant) return 0;
@@ -49,7 +49,7 @@ struct Wish {
   }
 };
 
-/// One for each name; nothing for a name that is not a language or occurred before.
+/// One entry per name; nothing for a name that is no language or has occurred before.
 std::vector<std::optional<LanguageTag>> parseTags(const std::vector<std::string>& names) {
   std::vector<std::optional<LanguageTag>> tags;
   const std::size_t count = std::min(names.size(), limits::kLanguages);

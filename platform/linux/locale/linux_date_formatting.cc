@@ -12,8 +12,8 @@
 namespace tavrel {
 namespace {
 
-// Seconds east of UTC at an instant. The C library reads zone files; the only way to choose one is
-// its environment variable.
+// Seconds east of UTC at an instant. The C library reads zone files, but lets a program choose one
+// only through the environment variable TZ.
 std::int64_t offsetAt(std::int64_t seconds, const std::string& zoneFile) {
   ::setenv("TZ", (':' + zoneFile).c_str(), 1);
   ::tzset();
@@ -22,7 +22,7 @@ std::int64_t offsetAt(std::int64_t seconds, const std::string& zoneFile) {
   return ::localtime_r(&instant, &local) ? local.tm_gmtoff : 0;
 }
 
-// The year before year 1 is year 1 of the era before.
+// The year before year 1 is year 1 of the previous era.
 std::int64_t yearOfEra(std::int64_t year) {
   return year > 0 ? year : 1 - year;
 }

@@ -111,7 +111,7 @@ std::vector<std::string> LinuxLocale::preferredLanguages() {
   while (!list.empty()) {
     const std::size_t end = std::min(list.find(':'), list.size());
     const std::string_view name = list.substr(0, end);
-    // Languages after "C" are never searched: texts in C exist for everything.
+    // Languages after "C" never count: untranslated texts exist for everything.
     if (name == "C" || name == "POSIX") return languages.take();
     languages.addNamed(name);
     list.remove_prefix(std::min(end + 1, list.size()));
@@ -163,7 +163,7 @@ std::vector<std::string> LinuxLocale::matchLocalizations(
 std::optional<std::string> LinuxLocale::countryCode() {
   const Variables variables = readVariables();
   const auto tag = parseLanguageTag(firstSet(variables, {"LC_ALL", "LC_MEASUREMENT", "LANG"}));
-  // Regions of three digits are groups of countries.
+  // Three-digit regions are groups of countries.
   if (!tag || tag->region.size() != 2) return std::nullopt;
   return tag->region;
 }

@@ -58,7 +58,7 @@ void FileCrashReporting::refuse(std::uint32_t type, const Error& error) {
            type == kEccRecordType ? "wait for the next run" : "are dropped", error.message);
 }
 
-// One that cannot be opened is not tried again for each record of a run: its lock is waited for.
+// A file that cannot be opened is not tried again for each record: each try may wait for its lock.
 FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t type,
                                                                std::int64_t day) {
   const auto known = recordFiles_.find(type);
@@ -84,7 +84,7 @@ std::vector<std::string> FileCrashReporting::oldRecordFiles() {
     log_.write(LogLevel::Error, files.error().message);
     return {};
   }
-  // In the order in which days go.
+  // Days in order of removal.
   const std::int64_t tomorrow = dayOf(clock_.now()) + 1;
   const auto rank = [tomorrow](const RecordFileName& file) {
     return std::pair(file.day <= tomorrow, file.day);
@@ -131,8 +131,8 @@ bool FileCrashReporting::hasSupportLog() {
   return isFilled(root_.path(kSupportLog));
 }
 
-// Only the logs below the first free number move. A roll that was cut short leaves such a gap; the
-// next one completes it, and no log is lost.
+// Moves only the logs below the first free number. A roll that was cut short leaves such a gap; the
+// next roll closes it, and no log is lost.
 void FileCrashReporting::rollNorvaneCareLogs() {
   if (!hasSupportLog()) return;
   const std::string log = root_.path(kSupportLog);
@@ -154,7 +154,7 @@ std::string FileCrashReporting::fact(std::string_view devicePath) {
   auto content = files_.readIfPresent(root_.pathOrMachine(devicePath), limits::kSystemFactBytes);
   if (!content || !*content) return {};
   std::string text = *std::move(*content);
-  // Device trees end their texts with a null character.
+  // Device-tree strings end with a null character.
   const auto isBlank = [](char c) { return static_cast<unsigned char>(c) <= 0x20; };
   text.erase(std::find_if_not(text.rbegin(), text.rend(), isBlank).base(), text.end());
   text.erase(text.begin(), std::find_if_not(text.begin(), text.end(), isBlank));

@@ -21,7 +21,7 @@ constexpr std::string_view kRefused = "/refused";
 
 constexpr std::size_t kWithheldLogs = 8;
 
-// Statistics are readable by their owner and a group of operators only; what is withheld, by its
+// Logs are readable only by their owner and a group of operators; withheld logs only by their
 // owner.
 constexpr mode_t kMode = 0640;
 constexpr mode_t kWithheldMode = 0600;
@@ -61,8 +61,8 @@ std::int32_t FileSubmission::today() const {
   return services_.reportedDays.BHDaysSince1970();
 }
 
-// Gated and forced runs report the day before. A run that reports its own, unfinished day gets the
-// same answer, and one that names an older day is refused when it files its log.
+// Gated and forced runs report yesterday. A run that reports today, still unfinished, gets the same
+// answer, and one that names an older day is refused when it files its log.
 bool FileSubmission::isDiagnosticSubmissionEnabled() {
   services_.reportedDays.takeEarliest();
   const SubmissionPermission permission = submissionPermission(services_.preferences);
@@ -77,8 +77,8 @@ bool FileSubmission::isDiagnosticSubmissionEnabled() {
   return false;
 }
 
-// The switch may have been turned off by hand, and a deletion may have been cut off. Preferences
-// that cannot be read may hold a permission: nothing is sent, and nothing deleted.
+// The switch may have been turned off by hand, or a deletion cut short. Unreadable preferences may
+// hold a permission: then nothing is sent, and nothing deleted.
 void FileSubmission::completeWithdrawal() {
   const auto stored = storedSubmissionPermission(services_.filePreferences);
   if (!stored || stored->isGiven) return;
@@ -168,7 +168,7 @@ Status FileSubmission::commit(NewFile& file, const Destination& destination,
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return lock.error();
   if (!isWithheld) {
-    // Another permission than the one that the log was begun under may cover later days only.
+    // The permission may have changed since the log was begun, and may now cover only later days.
     const auto stored = storedSubmissionPermission(services_.filePreferences);
     if (!stored) return stored.error();
     if (!stored->covers(destination.day)) return Error{"submission is no longer allowed"};
@@ -180,7 +180,7 @@ Status FileSubmission::commit(NewFile& file, const Destination& destination,
     done = file.commit();
   }
   if (!done) {
-    // The log goes first: as long as it can be seen, its metadata can.
+    // The log goes first: a visible log always has its metadata.
     files_.discard(join(folder(place), name, kLogEnding));
     files_.discard(metadataPath);
     return done;
@@ -200,7 +200,8 @@ Status FileSubmission::checkPermission() const {
   return Done{};
 }
 
-// Without a list of names, which takes several times as long to make as to read.
+// Without `FileSystem::list`: building a sorted list takes several times as long as reading the
+// folder.
 Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
   const std::string path = folder(place);
   const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir(path.c_str()), closedir);
@@ -218,10 +219,10 @@ Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
   return files;
 }
 
-// Removes what a process left that was killed while filing a log. Ages are measured by the file
-// system's own clock, from the stamp of a file made just now.
+// Removes metadata left by a process that was killed while filing a log. Ages are measured by the
+// file system's own clock, from the timestamp of a file made just now.
 void FileSubmission::removeOldMetadata(Place place, const std::string& freshMetadata) {
-  // Of the log that is being filed there is only the metadata yet.
+  // Plus one, because the log being filed has only its metadata so far.
   const auto counts = countFiles(place);
   if (!counts || counts->metadata <= counts->logs + 1) return;
   const auto fresh = FileSystem::status(freshMetadata);
@@ -252,8 +253,8 @@ void FileSubmission::submitDiagnosticLogs() {
   for (const std::string& file : *files) {
     std::string name = withoutEnding(file, kLogEnding);
     if (name.empty()) {
-      // Metadata follows its log, which precedes it in the list or moved before a process was
-      // killed.
+      // Metadata moves after its log. Left over here, its log has already moved, before it in this
+      // list or before a process was killed.
       name = withoutEnding(file, kLogMetadataEnding);
       if (!name.empty() && !FileSystem::status(join(folder(Place::Pending), name, kLogEnding)) &&
           FileSystem::status(join(folder(Place::Outbox), name, kLogEnding))) {
@@ -261,7 +262,7 @@ void FileSubmission::submitDiagnosticLogs() {
       }
       continue;
     }
-    // What another process has sent on or deleted in the meantime needs no line.
+    // A log that another process has sent on or deleted in the meantime needs no log line.
     if (Status moved = moveToOutbox(name);
         !moved && FileSystem::status(join(folder(Place::Pending), file, {}))) {
       log_.log(LogLevel::Error, "cannot move log \"%s\" to the outbox: %s", name,
@@ -347,7 +348,7 @@ RemovedLogs FileSubmission::removeAll() {
                     false);
 }
 
-// Logs move from pending to the outbox, so in this order none escapes.
+// Logs move from pending to the outbox; with the folders in this order none escapes.
 RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
                                        bool onlyWithoutPermission) {
   if (!FileSystem::status(folder_)) return {};

@@ -15,9 +15,9 @@ std::optional<std::int32_t> dayOf(plist::Date start) {
   return static_cast<std::int32_t>(day);
 }
 
-// The day of a log in the form in which the daemon writes it. Text in it has no "<", and what lies
-// deeper has more tabs, so that nothing else looks like this; a log of many keys need not be parsed
-// for it. Nothing for a log in another form.
+// The day of a log in the exact form in which the daemon writes it, found without parsing a log of
+// many keys. Text contains no "<", and deeper keys have more tabs, so nothing else matches. Nothing
+// for a log in another form.
 std::optional<std::int32_t> dayInText(std::string_view text) {
   constexpr std::string_view kBefore = "\n\t<key>BHStartDate</key>\n\t<date>";
   if (!text.ends_with("</plist>\n")) return std::nullopt;

@@ -13,7 +13,7 @@ namespace {
 constexpr std::size_t kLongestNamePart = 64;
 constexpr std::size_t kUniqueDigits = 8;
 
-// "YYYYMMDDTHHMMSSZ". Years beyond 9999 have more digits, which nobody files.
+// "YYYYMMDDTHHMMSSZ". Names with years after 9999, which have more digits, are not recognised.
 constexpr std::string_view kStampForm = "00000000T000000Z";
 
 bool isDigit(char c) {

@@ -25,7 +25,7 @@ class ReportedDays::History final : public BHHistory {
   }
 
  private:
-  // Rows begin on the day after the bound.
+  // The lower bound is exclusive: rows begin on the day after it.
   void note(std::int64_t dayBefore) {
     const std::int64_t day = wrappingAdd(dayBefore, std::int64_t{1});
     earliest_ = std::min(earliest_.value_or(day), day);

@@ -167,7 +167,7 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   const auto locked = files_.lockFile(folder_ + "/.lock");
   if (!locked) return locked.error();
   auto content = readContent(path);
-  // A file that the system does not let us read may be whole, so it is not replaced.
+  // A file that this process cannot read may be intact, so it is not replaced.
   if (!content) return content.error();
   if (!content->fault.empty()) {
     if (Status aside = setAside(path, content->fault); !aside) return aside;
@@ -185,7 +185,8 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
                  std::to_string(bytes->size()) + " bytes, and the limit is " +
                  std::to_string(limits::kPreferenceFileBytes) + "; remove some"};
   }
-  // Equal bytes spare the flash, unless an earlier attempt may have failed to make them durable.
+  // Skip writing equal bytes, to spare the flash, unless an earlier attempt may not have made them
+  // durable.
   if (*bytes != content->bytes || domain.unwritableReported) {
     if (Status replaced = files_.replace(path, asBytes(*bytes), kMode); !replaced) return replaced;
   }
@@ -193,8 +194,8 @@ Status FilePreferences::writeChanges(Domain& domain, std::string_view name) {
   return Done{};
 }
 
-// A change that the file cannot hold, such as a date that is not a number or a huge text, must not
-// keep the rest of its domain from being written.
+// A change that the file cannot hold, such as a not-a-number date or a huge text, must not keep the
+// domain's other changes from being written.
 Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
                                                       const plist::Dictionary& stored,
                                                       plist::Dictionary& merged,
@@ -208,8 +209,8 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
     merged.set(key, stored.get(key));
     domain.changes.erase(key);
   };
-  std::vector<std::pair<std::size_t, std::string>> changes;  // each with the bytes that it needs
-  std::map<std::string, std::string> unfit;                  // each with the reason
+  std::vector<std::pair<std::size_t, std::string>> changes;  // bytes needed, key
+  std::map<std::string, std::string> unfit;                  // key, reason
   for (const auto& [key, value] : domain.changes) {
     if (value.isNull()) continue;
     const auto alone = propertyLists_.encodeXml(plist::Dictionary{{key, value}});
@@ -231,7 +232,7 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
     const std::string why =
         format("the file would have %llu bytes with it; the limit is %llu",
                std::uint64_t{bytes->size()}, std::uint64_t{limits::kPreferenceFileBytes});
-    // Encoding again after each of many small changes would take for ever.
+    // Drop several at once: encoding again after each of many small changes would take for ever.
     std::size_t excess = bytes->size() - limits::kPreferenceFileBytes;
     while (excess > 0 && !changes.empty()) {
       const auto [size, key] = std::move(changes.back());

@@ -17,7 +17,7 @@ namespace {
 
 using SteadyClock = std::chrono::steady_clock;
 
-/// What epoll reports for the signals' descriptor; sources count from 1.
+/// The ID of the signal descriptor in epoll events; sources are numbered from 1.
 constexpr std::uint64_t kSignalsId = 0;
 
 /// Longer slices are cut to this, so that no sum with the clock can overflow.
@@ -31,7 +31,8 @@ sigset_t terminatingSignals() {
   return set;
 }
 
-/// Rounded up: a wait that ends before its time would spin through the last millisecond.
+/// Rounded up: otherwise waits would end early, and the loop would spin through the last
+/// millisecond.
 int millisecondsUntil(SteadyClock::time_point deadline) {
   const auto left = std::chrono::ceil<std::chrono::milliseconds>(deadline - SteadyClock::now());
   return static_cast<int>(std::clamp<std::int64_t>(left.count(), 0, 1 << 30));
@@ -48,7 +49,7 @@ void LinuxEventLoop::Source::stop() {
 
 LinuxEventLoop::~LinuxEventLoop() {
   if (!signalsHeld_) return;
-  // A second request to end must not kill a process that is ending already.
+  // A second termination signal must not kill a process that is already ending.
   takeSignal();
   pthread_sigmask(SIG_SETMASK, &maskBefore_, nullptr);
 }
@@ -84,7 +85,7 @@ void LinuxEventLoop::holdSignals() {
   interest.data.u64 = kSignalsId;
   if (!signals_ || !openPoll() ||
       epoll_ctl(poll_.get(), EPOLL_CTL_ADD, signals_.get(), &interest) != 0) {
-    // The signals keep their usual effect: they end the process at once.
+    // The signals keep their default effect: they end the process at once.
     signals_.reset();
     return;
   }
@@ -105,16 +106,16 @@ EventLoop::Slice LinuxEventLoop::runSlice(std::chrono::milliseconds longest) {
       std::clamp<std::chrono::milliseconds>(longest, std::chrono::milliseconds(0), kLongestSlice);
   holdSignals();
   do {
-    // Checked first each time, so that a crowd of ready sources cannot delay it.
+    // Checked first each time, so that many ready sources cannot delay it.
     if (takeSignal()) return Slice::Terminated;
 
-    // Only one at a time: the kernel moves a reported source to the end of its list, which is fair,
-    // and no event is left over for a source that a callback has removed.
+    // One event at a time: this is fair, since the kernel moves a reported source to the end of its
+    // list, and leaves no event for a source that a callback has removed.
     epoll_event event;
     const bool isOpen = openPoll();
     const int ready = isOpen ? epoll_wait(poll_.get(), &event, 1, millisecondsUntil(deadline)) : -1;
     if (ready < 0 && (!isOpen || errno != EINTR)) {
-      // There is nothing to wait for, and another attempt would only spin.
+      // Waiting for events is impossible, and another attempt would only spin.
       std::this_thread::sleep_until(deadline);
       break;
     }

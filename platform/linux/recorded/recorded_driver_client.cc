@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-// True when the row has no such condition, or the request meets it.
+// True when the row has no condition on `key`, or the request meets it.
 template <class Word>
 bool hasField(const plist::Dictionary& row, std::string_view key, std::optional<Word> inRequest) {
   const plist::Value wanted = row.get(key);

@@ -30,7 +30,7 @@ class RecordedRegistry::State {
   }
 
   SystemLog& log;
-  std::optional<RecordingFolder> folder;  // nothing when one recording is played
+  std::optional<RecordingFolder> folder;  // nothing when a single recording is played
   std::vector<RecordingPart> parts;
   LiveServices* live = nullptr;
 
@@ -89,8 +89,8 @@ std::shared_ptr<DriverService> RecordedRegistry::firstService(std::string_view c
   return std::make_shared<RecordedService>(recording, positions.front(), state_->log);
 }
 
-// Each key of the dictionary is a condition, and all must hold. An unknown or malformed condition
-// holds for no service.
+// Each key of the dictionary is a condition, and all must hold. No service meets an unknown or
+// malformed condition.
 KernelReturn RecordedRegistry::matchingServices(const plist::Dictionary& matching,
                                                 std::unique_ptr<ServiceIterator>& services) {
   if (!matching) return kKernelBadArgument;

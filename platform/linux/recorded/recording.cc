@@ -37,7 +37,7 @@ std::string faultOfService(const plist::Dictionary& record) {
   return faultOf(kServiceFields, record);
 }
 
-// The rows that can be played, of service number `service` of its part.
+// The playable rows of the service; `service` is its index in its part, for messages.
 std::vector<plist::Dictionary> rowsOf(const plist::Dictionary& record, std::string_view origin,
                                       std::size_t service, RefusalLog& refusals) {
   std::vector<plist::Dictionary> rows;
@@ -58,7 +58,7 @@ std::vector<plist::Dictionary> rowsOf(const plist::Dictionary& record, std::stri
   return rows;
 }
 
-// Adds what earlier parts lack.
+// Adds the fields that earlier parts lack.
 void mergeHub(plist::Dictionary& merged, const RecordingPart& part, RefusalLog* refusals) {
   const auto isRefused = [&](std::string_view key, const char* where, const char* wanted) {
     if (wanted && refusals) {

@@ -33,13 +33,13 @@ std::vector<RecordingFolder::Stamp> RecordingFolder::stampFiles() {
   return stamps;
 }
 
-// Stamps are taken before the files are read, so that the next update reads again a file that was
-// replaced in between.
+// Stamps are taken before the files are read: a file replaced in between is read again by the next
+// update.
 bool RecordingFolder::update(std::vector<RecordingPart>& parts) {
   std::vector<Stamp> stamps = stampFiles();
   if (stamps == stamps_) return false;
   std::vector<RecordingPart> updated;
-  std::size_t known = 0;  // both lists are in the order of their names
+  std::size_t known = 0;  // both lists are sorted by name
   for (const Stamp& stamp : stamps) {
     while (known < stamps_.size() && stamps_[known].path < stamp.path)
       ++known;

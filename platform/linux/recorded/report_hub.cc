@@ -18,12 +18,12 @@ constexpr std::uint32_t kOpen = kIOReportUserClientOpen;
 constexpr std::uint32_t kConfigure = kIOReportUserClientConfigureInterests;
 constexpr std::uint32_t kUpdate = kIOReportUserClientUpdateKernelBuffer;
 
-// The id that readers take as absent. Its driver is 0, so a channel without both ids does not
-// match.
+// The channel ID that readers take as absent. With driver 0, such a group does not even match a
+// channel that lacks both IDs.
 constexpr std::uint64_t kNoChannel = std::uint64_t{1} << 63;
 constexpr std::size_t kLargestGroupElements = 0xFFFF;
 
-// Groups of no channel over all of `rest`.
+// Fills all of `rest` with groups that belong to no channel.
 void fillWithNothing(MutableByteSpan rest) {
   std::fill(rest.begin(), rest.end(), std::byte{0});
   while (!rest.empty()) {
@@ -34,7 +34,7 @@ void fillWithNothing(MutableByteSpan rest) {
   }
 }
 
-// A channel that the hub knows; without a recorded one the next live one.
+// A channel that the hub knows: a recorded one or, when null, the next live one.
 struct Interest {
   const HubChannel* recorded;
 };
@@ -93,7 +93,7 @@ class ReportHubClient final : public UserClient {
     return kKernelNoMemory;
   }
 
-  // Another call replaces the buffer; mappings of the earlier one keep their content.
+  // A later call replaces the buffer; mappings of the earlier buffer stay valid.
   KernelReturn configure(ByteSpan interests, std::uint64_t& bufferID) {
     const auto count = loadLittle32(interests, 0);
     if (!count || loadLittle32(interests, 4) != 0U ||

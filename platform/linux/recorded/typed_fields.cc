@@ -14,7 +14,7 @@ struct FormOfValue {
   const char* words;
 };
 
-// In the order of the forms.
+// Indexed by `RecordedField::Form`.
 constexpr FormOfValue kForms[] = {
     {plist::Kind::Number, "an integer"},
     {plist::Kind::Array, "an array of integers"},

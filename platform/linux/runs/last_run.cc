@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// The contents of a file of the kernel, without the line end; empty when it cannot be read.
+// The content of a kernel file without its line end; empty when it cannot be read.
 std::string kernelText(const std::string& path) {
   auto text = FileSystem().read(path, limits::kSystemFactBytes);
   if (!text) return {};
@@ -23,7 +23,7 @@ std::string bootOfMachine() {
   return kernelText("/proc/sys/kernel/random/boot_id");
 }
 
-// 0 when there is no such process.
+// The process's start in clock ticks since boot; 0 when there is no such process.
 std::int64_t startOf(std::int64_t process) {
   const std::string stat = kernelText("/proc/" + std::to_string(process) + "/stat");
   return static_cast<std::int64_t>(startInStat(stat).value_or(0));
@@ -49,7 +49,7 @@ void LastRun::addError(std::string_view message) {
   ++errorCount;
   if (errors.size() >= kErrors) return;
   std::size_t size = std::min(message.size(), kErrorBytes);
-  // Not within a character.
+  // Do not cut within a character.
   while (size > 0 && size < message.size() && (message[size] & 0xC0) == 0x80)
     --size;
   errors.emplace_back(message.substr(0, size));

@@ -6,7 +6,7 @@
 namespace tavrel {
 namespace {
 
-// With this line the daemon begins the tasks of a day.
+// The beginning of the line that the daemon logs when it begins a day's tasks.
 constexpr std::string_view kTasksBegin = "daily tasks for day ";
 
 }  // namespace

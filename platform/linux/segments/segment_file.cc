@@ -12,11 +12,11 @@
 namespace tavrel {
 namespace {
 
-// In place of kinds that keys have: not looked for yet, and none that can be used.
+// Values instead of a key's kind: not read yet, and no valid key.
 constexpr std::uint8_t kUnread = 0xff;
 constexpr std::uint8_t kNoKind = 0;
 
-// Names reach logs and tables.
+// Names appear in logs and tables, so control characters are refused.
 bool isValidName(std::string_view name) {
   return std::none_of(name.begin(), name.end(),
                       [](unsigned char c) { return c < ' ' || c == 127; }) &&
@@ -35,7 +35,7 @@ void SegmentFile::read(std::uint64_t offset, MutableByteSpan into) const {
     into = into.subspan(static_cast<std::size_t>(got));
   }
   std::fill(into.begin(), into.end(), std::byte{0});
-  // What is read next was not written earlier.
+  // Later reads must not return data older than this one.
   std::atomic_thread_fence(std::memory_order_acquire);
 }
 
@@ -61,13 +61,13 @@ SegmentFacts SegmentFile::facts() const {
   return facts;
 }
 
-// Reads the keys around the one with this number too: their names follow each other.
+// Also reads the neighbouring keys, whose names are adjacent.
 void SegmentFile::readKeys(std::uint32_t number) {
   constexpr std::uint32_t kAtOnce = 64;
   const std::uint32_t first = (number - 1) / kAtOnce * kAtOnce;
   std::array<std::byte, std::size_t{kAtOnce} * kBHKeyEntryBytes> entries;
   read(kBHKeyTable + std::uint64_t{first} * std::uint64_t{kBHKeyEntryBytes}, entries);
-  // A name is written before its entry, and so is there when the entries have been read.
+  // A name is written before its entry, so it is complete once the entry has been read.
   std::array<std::byte, 8192> names;
   std::uint64_t namesStart = 0;
   std::uint64_t namesEnd = 0;

@@ -9,8 +9,8 @@ namespace tavrel {
 namespace {
 
 // Layout, little-endian: u32 version, u32 cells, u32 chunks, u32 zero, u64 dropped, then the used
-// cells and chunks, each as its u32 number, which ascend, and its fields in order. The end of a
-// segment is another version alone.
+// cells and chunks, each as its u32 number, ascending, and its fields in order. The position at a
+// segment's end is only the version `kEndVersion`.
 constexpr std::uint32_t kVersion = 2;
 constexpr std::uint32_t kEndVersion = 3;
 constexpr std::uint64_t kHeadBytes = 24;
@@ -29,7 +29,7 @@ std::uint32_t countUsed(const std::vector<Part>& parts) {
          static_cast<std::uint32_t>(std::count(parts.begin(), parts.end(), Part{}));
 }
 
-// Room for the part with the number at `at`, behind all others; nothing when it has none.
+// Appends the part whose number is at `at`; null when that number does not ascend or is too large.
 template <class Part>
 Part* nextPart(std::vector<Part>& parts, ByteSpan bytes, std::uint64_t at, std::uint32_t limit) {
   const std::uint32_t number = *loadLittle32(bytes, at);

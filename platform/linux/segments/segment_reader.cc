@@ -16,10 +16,10 @@
 namespace tavrel {
 namespace {
 
-// How often to look at a cell that is being set, before it is left for later.
+// How often to look at a cell that is being set before leaving it for the next fold.
 constexpr int kCellAttempts = 8;
 
-// Chunks that are read with one call.
+// Chunks per system call.
 constexpr std::uint32_t kChunksAtOnce = 16;
 
 std::int64_t saturatingAdd(std::int64_t a, std::int64_t b) {
@@ -51,7 +51,7 @@ std::optional<Instant> dayAndSecond(std::int64_t seconds) {
   return Instant{static_cast<std::int32_t>(day), static_cast<std::uint32_t>(rest)};
 }
 
-// The same for many instants, most of which are of the same day: without divisions.
+// The same for many instants of mostly the same day, without divisions.
 class DayFinder {
  public:
   bool find(std::int64_t seconds) {
@@ -77,13 +77,13 @@ bool isUndated(std::uint64_t time) {
   return (time & kBHUndated) != 0;
 }
 
-// UTC seconds of a time in a segment. The boot's instant must be known for one without a date.
+// A segment's time as UTC seconds. For a time without a date, `boot` must be known.
 std::int64_t secondsOf(std::uint64_t time, BootInstant boot) {
   const auto seconds = static_cast<std::int64_t>(time & ~kBHUndated);
   return isUndated(time) ? saturatingAdd(seconds, *boot) : seconds;
 }
 
-// The same in nanoseconds, of the time of a set.
+// The time of a set as UTC nanoseconds, saturated.
 std::int64_t nanosecondsOf(std::uint64_t time, BootInstant boot) {
   const auto nanoseconds = static_cast<std::int64_t>(time & ~kBHUndated);
   std::int64_t atBoot = 0;
@@ -94,7 +94,7 @@ std::int64_t nanosecondsOf(std::uint64_t time, BootInstant boot) {
   return saturatingAdd(nanoseconds, atBoot);
 }
 
-// One look at a cell.
+// The content of a cell at one look.
 struct CellLook {
   std::uint64_t start = 0;
   std::uint64_t sets = 0;
@@ -126,7 +126,7 @@ bool awaitsAcknowledgement(const CellLook& look) {
   return look.closes % 2 != 0 && look.acknowledged != look.closes;
 }
 
-// What a header claims to be used is not remembered until it is.
+// A position does not store parts that the header claims but that are not in use.
 template <class Part>
 void dropUnused(std::vector<Part>& parts) {
   while (!parts.empty() && parts.back() == Part{})
@@ -150,7 +150,7 @@ struct SegmentReader::Reading {
   std::vector<std::byte> bytes;  // of chunks
 };
 
-// What is known of a chunk, and how far its records go.
+// The state of a chunk, and which of its records to take.
 struct SegmentReader::ChunkLook {
   std::uint32_t generation = 0;  // 0: nothing to read
   std::uint32_t acknowledged = 0;
@@ -171,7 +171,7 @@ SegmentReader::ChunkLook SegmentReader::chunkIn(ByteSpan bytes,
     look.folded = std::min<std::uint32_t>(position.folded, kBHChunkRecords);
   }
   look.ready = look.folded;
-  // Records of a writer that is gone may follow one that it did not finish.
+  // When the writer is gone, records may follow one that it never finished.
   look.hasNews = look.folded < kBHChunkRecords && (writerIsGone || markIn(bytes, look.folded) != 0);
   return look;
 }
@@ -186,7 +186,7 @@ Expected<SegmentReader::State> SegmentReader::state() const {
   if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
   if (!S_ISREG(status.st_mode)) return Error{"not a regular file"};
   const std::uint64_t magic = file_.word64(kBHHeaderMagic);
-  // Asked after the magic: its process gives the file the size before.
+  // Checked again after the magic, before which the process sets the file's size.
   if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
   if (magic == 0 && (status.st_size == 0 || status.st_size == kBHSegmentBytes)) return State::Empty;
   if (magic != kBHSegmentMagic) return Error{"not a segment"};
@@ -233,7 +233,7 @@ SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot,
 void SegmentReader::readCells(Reading& reading) {
   const std::uint32_t cells = cellsUsed();
   if (reading.position.cells.size() < cells) reading.position.cells.resize(cells);
-  // Many at once, to see which hold something new.
+  // Read many at once, to find those with news.
   constexpr std::uint32_t kAtOnce = 64;
   std::array<std::byte, std::size_t{kAtOnce} * kBHCellBytes> bytes;
   for (std::uint32_t first = 0; first < cells; first += kAtOnce) {
@@ -247,7 +247,7 @@ void SegmentReader::readCells(Reading& reading) {
   }
 }
 
-// Three looks: at the state, at the value, and whether the state is still the same.
+// Three looks: at the state, at the value, and at the state again, which must be unchanged.
 void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   const std::uint64_t offset = kBHCells + std::uint64_t{index} * std::uint64_t{kBHCellBytes};
   SegmentPosition::Cell& folded = reading.position.cells[index];
@@ -271,8 +271,8 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
     return;
   }
 
-  // Some fold has taken the cell's value, and its store is gone with the position. The cell may
-  // have got another time since, and nobody knows how much of the value belongs to that.
+  // An earlier fold took the cell's value, but its store, with the position, is lost. The cell may
+  // have moved to another day since, and nobody knows how much of the value belongs to that.
   if (!reading.position.isKnown && now.acknowledged != 0) {
     if (now.closes != now.acknowledged) ++reading.progress.refused;
     folded = {now.sets, now.value};
@@ -286,7 +286,8 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
       const std::int64_t time = isSet ? nanosecondsOf(now.setTime, reading.boot) : 0;
       reading.sink.takeScalar({*key, instant->day, isSet, value, time});
     } else {
-      // No honest program has such a cell: it is refused each time, and no store remembers it.
+      // No honest program makes such a cell: it is refused at each read, and its position is not
+      // stored.
       ++reading.progress.refused;
       return;
     }
@@ -310,8 +311,8 @@ void SegmentReader::readChunks(Reading& reading, std::uint32_t first, std::uint3
     looks[i] = chunkIn(bytesOf(i), reading.position.chunks[first + i], reading.writerIsGone);
     hasNews = hasNews || looks[i].hasNews;
   }
-  // Without a writer what was read is whole. With one, the records of a generation are looked for
-  // after it, and read after they were found.
+  // Without a writer, the first read is complete. With one, marks are read again after the
+  // generation, and records are read again after their marks.
   const bool looksAgain = hasNews && !reading.writerIsGone;
   if (looksAgain) file_.read(offset, reading.bytes);
   for (std::uint32_t i = 0; i < count; ++i) {
@@ -322,7 +323,7 @@ void SegmentReader::readChunks(Reading& reading, std::uint32_t first, std::uint3
     takeChunk(reading, bytesOf(i), first + i, looks[i]);
 }
 
-// Finds how many records are complete, or dated, one after the other.
+// Counts the consecutive records that are complete and have, or can be given, a date.
 void SegmentReader::findRecords(Reading& reading, ByteSpan bytes, ChunkLook& look) {
   for (look.ready = look.folded; look.ready < kBHChunkRecords; ++look.ready) {
     const std::uint64_t mark = markIn(bytes, look.ready);
@@ -345,7 +346,7 @@ void SegmentReader::takeChunk(Reading& reading, ByteSpan bytes, std::uint32_t in
   DayFinder days;
   for (std::uint32_t record = look.folded; record < look.ready; ++record) {
     const std::uint64_t mark = markIn(bytes, record);
-    // Only a hostile writer withdraws a mark, or its date.
+    // Only a hostile writer removes a mark or its date.
     if (mark == 0 || (isUndated(mark) && !reading.boot)) continue;
     const std::uint64_t time = (mark & ~kBHUndated) >> 16 | (mark & kBHUndated);
     const auto number = static_cast<std::uint32_t>(mark & 0xffff);

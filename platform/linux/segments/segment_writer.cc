@@ -49,8 +49,8 @@ SegmentWriter findSegmentProcess(const SegmentFacts& facts) {
 }
 
 SegmentWriter findSegmentWriter(int descriptor, const SegmentFacts& facts) {
-  // When somebody opens the file for writing during the lease, the kernel sends this signal, which
-  // is ignored unless handled, instead of SIGIO, which ends the process.
+  // If somebody opens the file for writing during the lease, the kernel sends SIGURG, which is
+  // ignored by default, instead of SIGIO, which would end the process.
   if (fcntl(descriptor, F_SETSIG, SIGURG) == 0) {
     if (fcntl(descriptor, F_SETLEASE, F_RDLCK) == 0) {
       fcntl(descriptor, F_SETLEASE, F_UNLCK);

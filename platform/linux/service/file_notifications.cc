@@ -46,7 +46,7 @@ Expected<std::uint64_t> FileNotifications::tryPost(std::string_view name) {
   const auto path = pathOf(name);
   if (!path) return path.error();
   FileSystem files;
-  // Not the counter itself: everybody who may read it could lock it and hold the others up.
+  // Not the counter itself: everybody who can read it could lock it and block posters.
   const auto lock = files.lockFile(folder_ + "/.lock");
   if (!lock) return lock.error();
 

@@ -41,7 +41,7 @@ Expected<plist::Dictionary> readMessageFile(int file) {
     return Error{format("the memory file has %llu bytes, the limit is %llu", size,
                         std::uint64_t{limits::kMessageFileBytes})};
   }
-  // Read, not mapped: files of huge pages have lengths that cannot be unmapped.
+  // Read, not mapped: a file of huge pages cannot be unmapped with its plain length.
   const auto content = std::make_unique_for_overwrite<std::byte[]>(size);
   std::uint64_t length = 0;
   while (length < size) {
@@ -69,7 +69,7 @@ std::vector<Descriptor> takeDescriptors(msghdr& header) {
   return descriptors;
 }
 
-/// A packet without content reads like the end of the connection.
+/// Distinguishes the end of the connection from an empty packet, which reads the same.
 bool hasEnded(int socket) {
   pollfd state{.fd = socket, .events = POLLRDHUP, .revents = 0};
   return poll(&state, 1, 0) != 0;

@@ -17,7 +17,7 @@ namespace tavrel {
 
 namespace {
 
-/// Connections that wait in the kernel to be accepted; it cuts this to its own limit.
+/// Connections that may wait in the kernel to be accepted; the kernel has its own upper limit.
 constexpr int kBacklog = 4096;
 
 std::string serviceFile(const DeviceRoot& root, std::string_view name, std::string_view ending) {
@@ -30,7 +30,7 @@ Descriptor newSocket(int type) {
   return Descriptor(socket(AF_UNIX, type | SOCK_CLOEXEC | SOCK_NONBLOCK, 0));
 }
 
-/// Makes way for a socket at `path`; the caller holds the lock of the service.
+/// Removes a stale socket at `path`. The caller must hold the service's lock.
 Status removeStale(const std::string& path, const SocketAddress& address) {
   struct stat status;
   if (lstat(path.c_str(), &status) != 0) {
@@ -40,9 +40,9 @@ Status removeStale(const std::string& path, const SocketAddress& address) {
   if (!S_ISSOCK(status.st_mode)) {
     return Error{format("cannot listen at %s: the file there is not a socket; remove it", path)};
   }
-  // The service manager listens without the lock, and would start the service for a connection. A
-  // socket of another type never makes one: the kernel refuses its type when a process listens, and
-  // reports a missing owner when none does.
+  // The service manager listens without the lock, and a connection would start the service. A
+  // socket of another type never connects: when a process listens, the kernel refuses the type, and
+  // when none does, it refuses the connection.
   const Descriptor probe = newSocket(SOCK_DGRAM);
   if (!probe) return systemError("open a socket for", path);
   if (connect(probe.get(), address.get(), address.size()) == 0 || errno != ECONNREFUSED) {
@@ -105,7 +105,7 @@ Expected<ServiceSocket> ServiceSocket::open(const DeviceRoot& root, std::string_
 
   ServiceSocket result(newSocket(SOCK_SEQPACKET));
   if (!result.socket_) return systemError("open a socket for", path);
-  // The file gets the mode of its socket, so there is no moment in which others may connect.
+  // The file takes its mode from the socket, so at no moment can others connect.
   if (fchmod(result.get(), 0600) != 0 || bind(result.get(), address->get(), address->size()) != 0 ||
       listen(result.get(), kBacklog) != 0) {
     return systemError("listen at", path);

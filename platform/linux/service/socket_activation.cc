@@ -82,7 +82,7 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
             count, name, name);
     return {};
   }
-  // A copy of its own, so that releasing a listener does not free the number for other files.
+  // A duplicate, so that closing the listener does not free the number for other files.
   Descriptor socket(fcntl(chosen, F_DUPFD_CLOEXEC, kFirstActivatedDescriptor));
   const int flags = socket ? fcntl(socket.get(), F_GETFL) : -1;
   if (flags < 0 || fcntl(socket.get(), F_SETFL, flags | O_NONBLOCK) != 0) {

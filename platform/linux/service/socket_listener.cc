@@ -14,7 +14,7 @@ namespace tavrel {
 
 namespace {
 
-/// How long new peers wait when the system is short of something.
+/// How long new peers wait when the system is short of descriptors or memory.
 constexpr itimerspec kRetry{.it_interval = {0, 0}, .it_value = {1, 0}};
 
 }  // namespace
@@ -39,7 +39,7 @@ class SocketListener::Peer final : public PeerConnection {
 
   bool hasFailed() const { return hasFailed_; }
 
-  /// Makes the end of the peer an event, like its beginning.
+  /// Makes the end of the peer count as an event too.
   void count() { counts_ = true; }
 
  private:

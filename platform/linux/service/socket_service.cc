@@ -13,8 +13,8 @@ namespace tavrel {
 
 namespace {
 
-/// Allows a descriptor for each peer, up to the hard limit; the usual soft limit of 1,024 exists
-/// for programs that use select.
+/// Raises the soft limit, to have a descriptor per peer, up to the hard limit. The usual soft limit
+/// of 1,024 exists for programs that use select.
 void raiseDescriptorLimit() {
   constexpr rlim_t kWanted = limits::kServicePeers + 128;
   rlimit limit;

@@ -7,14 +7,14 @@
 namespace tavrel {
 namespace {
 
-// The value, then the offset.
+// A record is a value followed by its offset.
 constexpr std::size_t kRecordBytes = kPackedValueBytes + kPackedOffsetBytes;
 
 [[noreturn]] void refuse(const std::string& reason) {
   throw StoreFailure{StoreFault::Other, reason + ": restore the file from a copy or move it away"};
 }
 
-// How many items of one size there are in a chunk.
+// The number of items in a chunk.
 std::size_t countIn(std::string_view data, std::size_t itemBytes) {
   const std::size_t count = data.size() / itemBytes;
   if (count == 0 || count > kValuesPerChunk || data.size() != count * itemBytes) {

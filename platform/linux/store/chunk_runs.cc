@@ -6,7 +6,7 @@
 namespace tavrel {
 namespace {
 
-// The fewest.
+// The fewest chunks that can hold so many values.
 std::int64_t chunksFor(std::int64_t values) {
   return values / kValuesPerChunk + (values % kValuesPerChunk != 0 ? 1 : 0);
 }
@@ -18,7 +18,7 @@ void appendNumber(std::string& packed, std::int64_t number) {
   packed += static_cast<char>(rest);
 }
 
-// Takes a number from the front; nothing when there is none that is positive or 0.
+// Takes a number from the front; nothing when there is no valid, non-negative one.
 std::optional<std::int64_t> takeNumber(std::string_view& packed) {
   constexpr int kLastShift = 56;  // nine bytes hold 63 bits
   std::uint64_t number = 0;
@@ -31,8 +31,8 @@ std::optional<std::int64_t> takeNumber(std::string_view& packed) {
   return std::nullopt;
 }
 
-// A chunk holds from one value to as many as fit. Whoever removes a run relies on that: with more
-// chunks, it would take those of other runs.
+// A chunk holds at least one value, and at most `kValuesPerChunk`. The removal of a run relies on
+// this: a run with too many chunks would remove those of other runs.
 bool holds(std::int64_t chunks, std::int64_t values) {
   return chunks >= chunksFor(values) && chunks <= values;
 }
@@ -72,10 +72,10 @@ std::optional<std::int64_t> valuesIn(std::span<const ChunkRun> runs) {
 
 std::size_t firstToJoin(std::span<const ChunkRun> runs) {
   struct Rule {
-    std::int64_t below;  // values: which runs at the end are counted
+    std::int64_t below;  // counts runs of fewer values, from the end
     std::ptrdiff_t count;
   };
-  // The second rule leaves room for as many runs as the first lets stand.
+  // The limit of the second rule leaves room for the runs that the first leaves alone.
   constexpr Rule kRules[] = {{32, 32}, {kValuesPerChunk, 64}};
   std::size_t first = runs.size();
   for (const Rule& rule : kRules) {

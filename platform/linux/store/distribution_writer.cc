@@ -49,7 +49,7 @@ void DistributionWriter::append(std::int32_t day, std::string_view key,
   }
   runs.push_back({0, 0, addedCount});
   const std::size_t first = std::min(firstToJoin(runs), runs.size() - 1);
-  // Values that are damaged stay where they are, and each reader tells of them.
+  // Damaged values stay where they are, and each reader reports them.
   if (auto earlier = takeOut(std::span(runs).subspan(first, runs.size() - 1 - first))) {
     runs[first] = writeRun({earlier->values += added.values, earlier->offsets += added.offsets});
     runs.resize(first + 1);
@@ -67,8 +67,8 @@ void DistributionWriter::append(std::int32_t day, std::string_view key,
   setRuns_.run();
 }
 
-// Takes the chunks of the runs out of the store. Nothing, and nothing is changed, when they are not
-// what the runs say.
+// Takes the chunks of the runs out of the store. When they are not as the runs say, returns nothing
+// and changes nothing.
 std::optional<DistributionWriter::Packed> DistributionWriter::takeOut(
     std::span<const ChunkRun> runs) {
   if (runs.empty()) return std::nullopt;
@@ -93,7 +93,7 @@ std::optional<DistributionWriter::Packed> DistributionWriter::takeOut(
   return found;
 }
 
-// In new chunks after all others.
+// Writes new chunks after all others.
 ChunkRun DistributionWriter::writeRun(const DistributionBlock& block) {
   if (nextChunk_ < 0) {
     nextChunk_ = connection_.integer("SELECT ifnull(max(chunk) + 1, 0) FROM chunks");

@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// An entry is this head, little-endian, and its key. The file ends with the SHA-256 of all entries.
+// An entry is this little-endian head, then its key. The file ends with the SHA-256 of all entries.
 constexpr std::size_t kNumberAt = 0;
 constexpr std::size_t kDayAt = 4;
 constexpr std::size_t kValueAt = 8;
@@ -38,7 +38,7 @@ void append(std::string& out, const KeptValue& value) {
 std::uint32_t newNumber() {
   std::array<std::byte, 4> bytes{};
   fillRandom(bytes);
-  return *loadLittle32(bytes, 0) | 1U;  // never 0, the id of a new store
+  return *loadLittle32(bytes, 0) | 1U;  // never 0, a new store's application ID
 }
 
 KeptContent decode(std::string_view text) {

@@ -8,12 +8,12 @@
 namespace tavrel {
 namespace {
 
-// The memory of a distribution, without its values.
+// Estimated memory of a distribution without its values.
 constexpr std::size_t kSeriesBytes = 256;
 
-// Values of a distribution's first piece, and at most of a later one. Each has room for twice as
-// many as the one before, so that few values take little memory. Pieces are small, so that those of
-// many distributions that grow at the same time share pages.
+// The number of values in a distribution's first piece, and the most in a later one. Each piece has
+// room for twice as many as the previous one, so that few values take little memory. Pieces stay
+// small, so that distributions growing at the same time share pages.
 constexpr std::uint32_t kFewest = 8;
 constexpr std::uint32_t kMost = 64;
 
@@ -22,7 +22,7 @@ constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
 }  // namespace
 
 std::size_t PendingDistributions::HashName::operator()(const Name& name) const {
-  // An odd factor keeps the days of one key apart.
+  // The odd factor keeps the days of one key apart.
   return keyedHash(name.key) +
          static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
 }

@@ -15,7 +15,7 @@ std::byte* map(std::size_t bytes) {
   void* const begin =
       mmap(nullptr, bytes, PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
   if (begin == MAP_FAILED) throw std::bad_alloc();
-  // Where the kernel knows no such advice, each page is made at its first use.
+  // Without kernel support for this advice, each page is provided at its first use.
   static_cast<void>(madvise(begin, bytes, MADV_POPULATE_WRITE));
   return static_cast<std::byte*>(begin);
 }
@@ -44,7 +44,7 @@ std::byte* SampleMemory::take(std::size_t bytes) {
 void SampleMemory::addSlab() {
   const std::size_t bytes =
       slabs_.empty() ? kSmallest : std::min(2 * slabs_.back().bytes, kLargest);
-  // Nothing can fail between the mapping and its entry.
+  // Reserve first, so that nothing can fail between the mapping and its entry.
   slabs_.reserve(slabs_.size() + 1);
   slabs_.push_back({map(bytes), bytes});
 }

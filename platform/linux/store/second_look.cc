@@ -23,8 +23,8 @@ StoreFailure unreadable(const char* what, int code) {
                                   "): check the file system that holds it"};
 }
 
-// Reads the database through SQLite: closing a file of one's own would give up the locks that this
-// process has on it.
+// Reads the database file through SQLite: closing a descriptor of our own would release this
+// process's locks on the file.
 void readDatabase(const std::string& path) {
   struct Close {
     void operator()(sqlite3* connection) const { sqlite().close_v2(connection); }
@@ -47,7 +47,7 @@ void readDatabase(const std::string& path) {
     code = file->pMethods->xRead(file, block.data(), static_cast<int>(length), at);
     at += length;
   }
-  // Another process may have shortened it.
+  // Another process may have shortened the file.
   if (code != SQLITE_OK && code != SQLITE_IOERR_SHORT_READ) throw unreadable("the file", EIO);
 }
 

@@ -13,8 +13,8 @@
 namespace tavrel {
 namespace {
 
-// Rows of either kind held back before they are written, in bytes. They are written in the order of
-// their keys: the more there are, the fewer pages are written twice.
+// Bytes of waiting rows, of either kind, above which they are written. They are written in key
+// order: the more rows at once, the fewer pages are written twice.
 constexpr std::size_t kPendingBytes = 16U << 20;
 
 void checkKey(std::string_view key) {
@@ -41,7 +41,7 @@ struct SqliteBatch::Statements {
 SqliteBatch::SqliteBatch(SqliteConnection connection, const StoreSite& site,
                          std::optional<FileIdentity> file)
     : connection_(std::move(connection)), site_(site), file_(file), kept_(site.path) {
-  // Rows are written in the order of their keys, so that few pages are changed again and again.
+  // A small cache is enough: rows are written in key order, so few pages are changed repeatedly.
   connection_.execute("PRAGMA cache_size = -2048");
 }
 
@@ -73,7 +73,7 @@ void SqliteBatch::takeKeptValues() {
   connection_.execute(("PRAGMA application_id = " + number).c_str());
 }
 
-// Another process may have replaced the file in the meantime.
+// Checks again under the lock, since another process may have replaced the file in the meantime.
 void SqliteBatch::setDamagedValuesAside() {
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
@@ -84,8 +84,8 @@ void SqliteBatch::setDamagedValuesAside() {
   }
 }
 
-// Values that others have kept in the meantime stay, and so does the file when it cannot be removed
-// now: the number tells the next batch which values to take in.
+// Values that others have kept in the meantime stay, and so does the file if it cannot be removed
+// now: their numbers show the next batch which values to take in.
 void SqliteBatch::removeTakenValues() {
   try {
     const StoreFolderLock lock(site_.path, *site_.busy);
@@ -190,7 +190,7 @@ Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
 
 Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
-  // As many as wait at most, so that a large span is no exception.
+  // In parts, so that a large span does not exceed the bound of waiting values either.
   constexpr std::size_t kAtOnce = kPendingBytes / (kPackedValueBytes + kPackedOffsetBytes);
   try {
     checkKey(key);
@@ -276,7 +276,7 @@ Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity i
 void SqliteBatch::writeDistributions() {
   if (distributions_.empty()) return;
   begin();
-  // In the order in which a day is read, so that reads go forward through the file.
+  // In the order in which a day is read, so that reads move forward through the file.
   distributions_.each(
       [this](std::int32_t day, std::string_view key, const DistributionBlock& added) {
         try {
@@ -319,10 +319,10 @@ SqliteConnection SqliteBatch::release() {
   return std::move(connection_);
 }
 
-// The changes are kept already, so that the log may stay as it is for now.
+// The changes are already durable, so a failure here only leaves the log longer.
 void SqliteBatch::limitLog() {
   const auto log = FileSystem::status(site_.path + "-wal");
-  // A shorter one may be a file that is kept for the next commits.
+  // A shorter file may be an emptied log, kept for the next commits.
   if (!log || log->st_size <= kKeptLogBytes) return;
   try {
     connection_.checkpoint(false);

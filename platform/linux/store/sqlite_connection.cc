@@ -51,7 +51,8 @@ Explanation explain(int code) {
   }
 }
 
-// Why the system forbids writing the database; 0 when it does not, or when there is no database.
+// The `errno` with which the system forbids writing the database; 0 when it does not, or when there
+// is no database.
 int obstacleToWriting(sqlite3* connection) {
   const char* const name = sqlite().db_filename(connection, "main");
   const std::string path = name ? name : "";
@@ -63,9 +64,9 @@ int obstacleToWriting(sqlite3* connection) {
   return 0;
 }
 
-// The system's code for a failure, 0 when there is none. When SQLite may not open a file for
-// writing, it tries again for reading and reports the code of that attempt; this asks for the code
-// of the first one.
+// The `errno` of a failure, 0 when there is none. When SQLite cannot open a file for writing, it
+// tries to open it for reading and reports the code of that attempt; this finds the code of the
+// first attempt.
 int systemCodeOf(sqlite3* connection, int code) {
   switch (code & 0xFF) {
     case SQLITE_IOERR:
@@ -97,8 +98,8 @@ int waitForLock(void* busy, int) {
   return static_cast<BusyBudget*>(busy)->wait();
 }
 
-// SQLite's URI form is the only way to ask for an immutable file; in it "%", "?" and "#" have a
-// meaning.
+// SQLite's URI form is the only way to ask for an immutable file; "%", "?" and "#" are special in
+// it.
 std::string immutableUri(const std::string& path) {
   static constexpr char kDigits[] = "0123456789ABCDEF";
   std::string uri = "file:";
@@ -153,8 +154,8 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       break;
     case Access::Read:
     case Access::ReadAlone:
-      // A user who may write can use a log that has no index. SQLite opens a write-protected file
-      // for reading.
+      // Ask for writing too: only a user who may write can use a log that has no index. SQLite
+      // falls back to reading for a write-protected file.
       flags |= SQLITE_OPEN_READWRITE;
       break;
     case Access::Immutable:
@@ -175,7 +176,8 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
     if (access == Access::ReadAlone || access == Access::WriteAlone) {
       execute("PRAGMA locking_mode = EXCLUSIVE");
     }
-    // Closing leaves the log: moving it each time would write every page twice for one commit.
+    // Closing keeps the log: moving it into the database each time would write every page twice per
+    // commit.
     sqlite().db_config(handle_, SQLITE_DBCONFIG_NO_CKPT_ON_CLOSE, 1, nullptr);
     execute("PRAGMA cell_size_check = ON; PRAGMA cache_size = -512; PRAGMA secure_delete = FAST");
   } catch (...) {
@@ -241,7 +243,7 @@ void SqliteStatement::bind(int index, std::int64_t value) {
 }
 
 void SqliteStatement::bind(int index, std::string_view bytes) {
-  // A null address would bind NULL instead of an empty blob.
+  // A null pointer would bind NULL instead of an empty blob.
   const char* const data = bytes.data() ? bytes.data() : "";
   check(sqlite().bind_blob64(handle_, index, data, bytes.size(), SQLITE_STATIC));
 }
@@ -258,7 +260,7 @@ bool SqliteStatement::step() {
 }
 
 void SqliteStatement::reset() {
-  // The code of a reset repeats the failure of the step before, which has been told.
+  // A reset returns the failure of the previous step again, which has been thrown already.
   sqlite().reset(handle_);
 }
 

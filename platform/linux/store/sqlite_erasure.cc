@@ -12,16 +12,16 @@
 namespace tavrel {
 namespace {
 
-// What one transaction removes at most; a single distribution may have more chunks.
+// The most that one transaction removes, although a single distribution may have more chunks.
 constexpr int kRowsAtOnce = 512;
 constexpr std::int64_t kChunksAtOnce = 4096;
 
-// Pages that one transaction overwrites, 1 MiB of the usual ones.
+// Pages that one transaction overwrites: 1 MiB at the usual page size.
 constexpr std::int64_t kPagesAtOnce = 256;
 
 constexpr off_t kLogBytes = 1 << 20;
 
-// The largest store that is copied; one process writes meanwhile, for a second or two.
+// The largest store that is copied. Other writers wait for a second or two meanwhile.
 constexpr std::int64_t kCopiedBytes = 64 << 20;
 
 std::string statement(std::string_view before, std::string_view table, std::string_view after) {
@@ -31,8 +31,8 @@ std::string statement(std::string_view before, std::string_view table, std::stri
   return sql;
 }
 
-/// The first day from `day` on that has a row. Texts and bytes, which damage may leave there, are
-/// not days.
+/// The first day from `day` on that has a row. Skips text and blobs, which damage may leave in the
+/// column.
 std::optional<std::int64_t> nextDay(SqliteConnection& connection, std::string_view table,
                                     std::int64_t day) {
   SqliteStatement rows(connection,
@@ -68,7 +68,7 @@ std::vector<std::string> nextKeys(SqliteConnection& connection, std::string_view
 
 StoreErasure::StoreErasure(SqliteConnection& connection, std::string storePath)
     : connection_(connection), path_(std::move(storePath)) {
-  // Of the pages that become free, too.
+  // Overwrites pages that become free, too.
   connection_.execute("PRAGMA secure_delete = ON");
 }
 
@@ -86,7 +86,7 @@ void StoreErasure::dropPages(SqliteConnection& connection) {
   connection.execute("DROP TABLE IF EXISTS erased");
 }
 
-// Rows of zeros take the free pages, as many as there are, and give them back.
+// Fills all free pages with rows of zeros, then frees them again.
 void StoreErasure::clearFreePages() {
   dropPages(connection_);
   std::int64_t free = connection_.integer("PRAGMA freelist_count");
@@ -141,7 +141,7 @@ bool StoreErasure::eraseSome(std::string_view table, std::int64_t day, const std
         row.bind(2, std::string_view(key));
         const bool isThere = row.step();
         auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
-        // What a damaged row refers to may belong to another.
+        // The chunks that a damaged row refers to may belong to another row.
         if (runs && valuesIn(*runs) != row.integer(0)) runs.reset();
         sum.distributions += isThere ? 1U : 0U;
         sum.values +=
@@ -172,7 +172,7 @@ void StoreErasure::eraseStrayChunks() {
   bool isDone = false;
   while (!isDone) {
     connection_.execute("BEGIN IMMEDIATE");
-    // What another process has recorded in the meantime has rows.
+    // Chunks that another process has recorded in the meantime have rows.
     if (connection_.integer("SELECT count(*) FROM (SELECT 1 FROM distributions LIMIT 1)") == 0) {
       connection_.execute(
           "DELETE FROM chunks WHERE chunk IN (SELECT chunk FROM chunks LIMIT 4096)");

@@ -14,7 +14,7 @@ namespace tavrel {
 namespace {
 
 StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
-  // The beginning of a long key says enough.
+  // The beginning of a long key is enough.
   constexpr std::size_t kShownBytes = 200;
   std::string message = "distribution ";
   appendQuoted(message, key.substr(0, kShownBytes));
@@ -24,7 +24,7 @@ StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreF
 
 class ChunkEnumerator : public BHHistoryDistributionEnumerator {
  public:
-  // `row` is at one of store_sql::distributions, and must stay there.
+  // `row` is a current row of a store_sql::distributions query, and must stay on it.
   ChunkEnumerator(const SqliteStatement& row, std::int64_t version, ChunkReader& reader)
       : row_(row), version_(version), reader_(reader) {}
   ~ChunkEnumerator() override { reader_.end(); }
@@ -73,8 +73,8 @@ class ChunkEnumerator : public BHHistoryDistributionEnumerator {
   std::optional<StoreFailure> failure_;
 };
 
-// Runs `next`, of store_sql::kNext, through the days that hold `key`, and calls `handle` for
-// each of its rows.
+// Steps `next`, a query with store_sql::kNext, through the days that hold `key`, and calls `handle`
+// for each row.
 template <class Handle>
 void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDay,
                std::int32_t lastDay, Handle handle) {
@@ -87,8 +87,8 @@ void eachDayOf(SqliteStatement& next, std::string_view key, std::int32_t firstDa
     const std::string_view found = next.bytes(0);
     const std::int64_t asked = std::exchange(day, next.integer(1));
     if (found == key) handle(stop);
-    // A later day that begins with a lower key may still have this one. In a damaged store a day is
-    // not always an integer, and may not seem to be later.
+    // A later day that begins with a lower key may still have this one. In a damaged store a day
+    // may not be an integer, and may appear not to be later.
     if (found >= key || day <= asked) day = std::max(day, asked) + 1;
     next.reset();
   }
@@ -169,7 +169,7 @@ void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
   }
 }
 
-// What was read without locks is valid only if nobody has written in the meantime.
+// Data read without locks is valid only if nobody has written in the meantime.
 void SqliteHistory::checkUnchanged() const {
   if (!store_->lockless || FileVersion::of(site_.path) == store_->lockless) return;
   throw StoreFailure{StoreFault::Busy, "was written while it was read: run the command again"};
@@ -183,7 +183,7 @@ void SqliteHistory::readUnchanged(Read read) {
     try {
       read();
     } catch (const StoreFailure& failure) {
-      // A writer may have converted the store since. The query has then not given any row yet.
+      // A writer may have converted the store since; the query has then not delivered any row yet.
       if (failure.fault != StoreFault::Foreign) throw;
       const auto before = std::exchange(version_, schemaVersion(store_->connection));
       if (version_ == before) throw;
@@ -259,7 +259,7 @@ Status SqliteHistory::walkDistribution(std::string_view key, std::int32_t firstD
 Expected<std::optional<SqliteHistory::DaySpan>> SqliteHistory::daysHeld() {
   std::optional<DaySpan> span;
   const Status read = attempt([&] {
-    // One look-up at either end of each table.
+    // One look-up at each end of each table.
     for (const char* table : {"scalars", "distributions"}) {
       for (const char* end : {"min", "max"}) {
         SqliteStatement statement(store_->connection,
@@ -313,7 +313,7 @@ Expected<SqliteHistory::Examination> SqliteHistory::examine(std::chrono::millise
     } catch (const StoreFailure&) {
       if (!limit.hasPassed()) throw;
     }
-    // What an interrupted check says of a fault may only mean that it was interrupted.
+    // A fault reported by an interrupted check may mean only that it was interrupted.
     examination.isWhole = !limit.hasPassed();
     if (!examination.isWhole) examination.fault.clear();
   });

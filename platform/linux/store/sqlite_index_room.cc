@@ -25,8 +25,8 @@ int IndexRoom::mapIndex(sqlite3_file* file, int region, int bytes, int extends,
   const auto* const methods = reinterpret_cast<const Methods*>(file->pMethods);
   const int code = methods->own->xShmMap(file, region, bytes, extends, at);
   if (code != SQLITE_OK || !*at) return code;
-  // Allocates as a write would, and fails where the write would raise SIGBUS. Another error means
-  // that the index is mapped for reading only, and nobody writes into it.
+  // Allocates as a write would, and fails with EFAULT where a write would raise SIGBUS. Another
+  // error means that the index is mapped read-only, so nobody writes into it.
   const auto page = static_cast<std::uintptr_t>(sysconf(_SC_PAGESIZE));
   auto* const begin = static_cast<std::byte*>(const_cast<void*>(*at));
   const std::uintptr_t before = reinterpret_cast<std::uintptr_t>(begin) % page;

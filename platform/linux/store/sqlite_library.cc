@@ -8,7 +8,7 @@
 namespace tavrel {
 namespace {
 
-// The name that a linked program would load. It has the interface of the header.
+// The name that a linked program would load; it guarantees the interface of the header.
 constexpr const char* kFile = "libsqlite3.so.0";
 
 [[noreturn]] void refuse() {

@@ -12,7 +12,7 @@
 namespace tavrel {
 namespace {
 
-// Without it the log counts as empty.
+// The log's header. When it is all zeros, SQLite takes the log as empty.
 constexpr std::size_t kHeadBytes = 32;
 
 }  // namespace
@@ -22,7 +22,7 @@ bool logHoldsPages(const std::string& path) {
   std::array<char, kHeadBytes> head{};
   const ssize_t size = file ? pread(file.get(), head.data(), head.size(), 0) : -1;
   if (size >= 0) return std::ranges::any_of(head, [](char byte) { return byte != 0; });
-  // One that this user may not read may hold anything.
+  // A log that this user may not read may hold anything.
   struct stat status {};
   return stat((path + "-wal").c_str(), &status) == 0 && status.st_size != 0;
 }
@@ -42,8 +42,8 @@ KeptLogFile::~KeptLogFile() {
   if (file_) file_->pMethods = methods_.own;
 }
 
-// The zeros need no flush. Until they, or the head of a new log, are on the medium, the old log is
-// there as a whole, and holds what has been moved and flushed already.
+// The zeros need no flush. Until they, or the header of a new log, reach the medium, the old log is
+// intact, and its content has already been moved to the database and flushed.
 int KeptLogFile::cutOff(sqlite3_file* file, sqlite3_int64 bytes) {
   const sqlite3_io_methods& own = *reinterpret_cast<const Methods*>(file->pMethods)->own;
   if (bytes != 0) return own.xTruncate(file, bytes);

@@ -16,8 +16,8 @@
 namespace tavrel {
 namespace {
 
-// For a new store, whatever the library was built with. A commit writes whole pages. Pages that old
-// days leave behind can be given back a few at a time.
+// For a new store, whatever the library's defaults. Small pages, because a commit writes whole
+// ones. Incremental vacuum, to give back the pages of removed days a few at a time.
 constexpr const char* kPages = "PRAGMA page_size = 4096; PRAGMA auto_vacuum = INCREMENTAL";
 
 // Keys are blobs: they are compared byte by byte and may hold any byte.
@@ -70,7 +70,7 @@ bool hasTables(SqliteConnection& connection) {
           "update tavrel, or move the file away"};
 }
 
-// Opening a pipe or a device in place of the store could block for ever.
+// Opening a pipe or a device instead of the store could block for ever.
 bool checkIsFile(const std::string& path) {
   struct stat status;
   if (lstat(path.c_str(), &status) != 0) {
@@ -86,15 +86,16 @@ bool checkIsFile(const std::string& path) {
   return true;
 }
 
-// A journal is left where another program has put the store in SQLite's older mode.
+// A journal file exists when another program has switched the store to SQLite's rollback-journal
+// mode.
 bool hasLog(const std::string& path) {
   struct stat status;
   return logHoldsPages(path) ||
          (stat((path + "-journal").c_str(), &status) == 0 && status.st_size != 0);
 }
 
-// The file's version, from which on each change shows. Many file systems stamp changes with a clock
-// that moves every 10 ms at most: two changes in one step have the same time.
+// The file's version, waiting until any later change must alter it. Many file systems stamp changes
+// with a clock that advances only every 10 ms: two changes within one step have the same time.
 std::optional<FileVersion> settledVersion(const std::string& path) {
   constexpr std::int64_t kStep = 20'000'000;  // nanoseconds, with a margin
   constexpr timespec kPause{0, kStep};
@@ -102,7 +103,7 @@ std::optional<FileVersion> settledVersion(const std::string& path) {
     const auto version = FileVersion::of(path);
     timespec now{};
     clock_gettime(CLOCK_REALTIME, &now);
-    // A time in the future says that the clock was set: waiting would not help.
+    // A time in the future means that the clock was set back: waiting would not help.
     const bool isRecent =
         version && (now.tv_sec - version->seconds == 0 || now.tv_sec - version->seconds == 1) &&
         (now.tv_sec - version->seconds) * 1'000'000'000 + now.tv_nsec - version->nanoseconds <
@@ -115,13 +116,13 @@ std::optional<FileVersion> settledVersion(const std::string& path) {
 void setUpForWriting(SqliteConnection& connection) {
   // Each commit is flushed: what was reported as kept also survives a power cut.
   connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
-  // SQLite's own checkpoint leaves the log's content there. The next process to open the store
-  // would not know that it has been moved, and would move it again.
+  // SQLite's automatic checkpoint leaves the log's content in place. The next process to open the
+  // store would not know that it has been moved, and would move it again.
   connection.execute("PRAGMA wal_autocheckpoint = 0");
 }
 
-// Who may only read the store can use the log when there is a file for its index, whatever it
-// holds. SQLite makes none for a connection that keeps all others out.
+// Users who may only read the store can use the log if an index file exists, whatever its content.
+// SQLite creates none for a connection that keeps all others out.
 void provideIndexFile(const std::string& path) {
   const std::string index = path + "-shm";
   struct stat status;
@@ -132,7 +133,8 @@ void provideIndexFile(const std::string& path) {
   if (isOwners) fchmod(made.get(), status.st_mode & 0666);
 }
 
-// The store for this process alone; nothing when that takes waiting, or more than opening it.
+// Opens the store for this process alone; nothing when that would need waiting, creating or
+// converting it.
 std::optional<SqliteConnection> openAlone(const std::string& path) {
   try {
     SqliteConnection connection(path, SqliteConnection::Access::WriteAlone,
@@ -142,7 +144,7 @@ std::optional<SqliteConnection> openAlone(const std::string& path) {
     provideIndexFile(path);
     return connection;
   } catch (const StoreFailure&) {
-    // Whoever opens it in the usual way tells.
+    // Opening the store in the usual way will report the failure.
     return std::nullopt;
   }
 }
@@ -191,7 +193,7 @@ void migrate(SqliteConnection& connection) {
       while (from.step()) {
         runs.clear();
         const std::int64_t count = from.integer(2);
-        // Without a run, a row that refers to nothing stays one.
+        // A row that refers to no chunks gets no run, and stays like that.
         const auto run = runOfSeries(from.integer(3), count);
         if (run && count > 0) appendRun(runs, *run);
         to.bind(1, from.integer(0));
@@ -215,8 +217,8 @@ void migrate(SqliteConnection& connection) {
 
 SqliteConnection openStoreForWriting(const std::string& path,
                                      const std::shared_ptr<BusyBudget>& busy, Sharing sharing) {
-  // SQLite gives its log files the mode of the store, and would create a store that all can read.
-  // An existing store is not opened for this: closing it would give up SQLite's locks.
+  // SQLite would create a store that everybody can read, and gives its log files the store's mode.
+  // An existing store is not opened here: closing it would release SQLite's locks.
   if (!checkIsFile(path)) {
     const Descriptor made(open(path.c_str(), O_WRONLY | O_CREAT | O_EXCL | O_CLOEXEC, 0640));
   }

@@ -139,9 +139,9 @@ bool SqliteStore::BHClientCheckpoint() {
 void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
   if (!logHoldsPages(site_.path)) return;
   const auto failure = attempt([&](const auto& identity) {
-    // The store has just been set aside with its log.
+    // No store: it has just been set aside with its log.
     if (!identity) return;
-    // Here, so that a failure closes it.
+    // Owned here, so that a failure closes the connection.
     SqliteConnection own =
         connection ? *std::exchange(connection, std::nullopt) : openForWriting(Sharing::Avoided);
     if (!own.checkpoint()) {
@@ -236,7 +236,8 @@ Expected<std::unique_ptr<SqliteTrim>> SqliteStore::beginTrim() {
   const auto failure = attempt([&](const auto& identity) {
     if (!identity) return;
     SqliteConnection connection = openForWriting(Sharing::WithReaders);
-    // Its pages would count as the store's, and whole days would go for them.
+    // The pages of an interrupted erasure would count as the store's, and whole days would be
+    // removed to make up for them.
     if (StoreErasure::hasLeftPages(connection)) {
       const StoreFolderLock lock(site_.path, *site_.busy);
       StoreErasure::dropPages(connection);

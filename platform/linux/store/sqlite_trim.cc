@@ -17,29 +17,29 @@
 namespace tavrel {
 namespace {
 
-// The work of one transaction, in rows of scalars: some milliseconds. A chunk has up to three
-// pages, which are freed one by one.
+// The work of one transaction, in scalar rows: some milliseconds. A chunk counts as several rows:
+// its up to three pages are freed one by one.
 constexpr std::int64_t kStepRows = 4096;
 constexpr std::int64_t kRowsPerChunk = 8;
 
 // Pages moved to holes at the front of the file in one transaction.
 constexpr std::int64_t kStepPages = 256;
 
-// Others look for the lock every five milliseconds.
+// Long enough for others, which try for the lock every five milliseconds.
 constexpr timespec kPause{0, 10'000'000};
 
 // A conversion copies the store through memory into its log, and other writers wait meanwhile:
 // a second or two on slow flash.
 constexpr std::int64_t kConvertibleBytes = 16 << 20;
 
-// Copy, log and what others write meanwhile.
+// Times the store's size: the copy, the log, and writes of others meanwhile.
 constexpr std::int64_t kConversionRoom = 3;
 
 constexpr std::int64_t kNoVacuum = 0;
 
 }  // namespace
 
-// A distribution, and those of its runs that are still there.
+// A distribution, and its runs that remain to be removed.
 struct SqliteTrim::Row {
   std::string key;
   std::int64_t count;
@@ -49,8 +49,8 @@ struct SqliteTrim::Row {
 std::vector<std::int32_t> daysIn(SqliteConnection& connection) {
   std::vector<std::int32_t> days;
   for (const char* table : {"scalars", "distributions"}) {
-    // Damage, or a writer other than ours, may put days there that are beyond 32 bits, have
-    // fractions, or are no numbers; the last come after all numbers.
+    // Damage, or another program, may leave days that exceed 32 bits, have fractions, or are no
+    // numbers, which sort after all numbers.
     SqliteStatement next(connection, std::string("SELECT day FROM ") + table +
                                          " WHERE day BETWEEN ?1 AND 2147483647"
                                          " ORDER BY day LIMIT 1");
@@ -97,8 +97,9 @@ Expected<std::int64_t> SqliteTrim::bytesInUse() {
   }
 }
 
-// Runs `step`, each time in a transaction, until it yields false. On a full disk the log is
-// emptied, so that its room can be used again; when that does not help, the steps become smaller.
+// Runs `step` repeatedly, each time in a transaction, until it returns false. On a full disk,
+// empties the log, so that its space can be used again; when that does not help, makes the steps
+// smaller.
 Status SqliteTrim::inSteps(std::int64_t budget, const std::function<bool(std::int64_t)>& step) {
   bool hasAdvanced = false;  // since the log was emptied
   while (true) {
@@ -139,9 +140,9 @@ bool SqliteTrim::removeSome(std::int32_t day, std::int64_t budget) {
   return left <= 0 || removeDistributions(day, left) <= 0;
 }
 
-// Yields how many, at most `budget`.
+// Returns how many it removed, at most `budget`.
 std::int64_t SqliteTrim::removeScalars(std::int32_t day, std::int64_t budget) {
-  // The key up to which so many rows go; nothing when there are no more than that.
+  // Finds the key of the last row within the budget; none when fewer rows are left.
   SqliteStatement last(connection_,
                        "SELECT key FROM scalars WHERE day = ?1 ORDER BY key LIMIT 1 OFFSET ?2");
   last.bind(1, day);
@@ -162,7 +163,7 @@ std::int64_t SqliteTrim::removeScalars(std::int32_t day, std::int64_t budget) {
   return connection_.integer("SELECT changes()");
 }
 
-// Yields what is left of the budget: 0 or less when there may be more of the day.
+// Returns the rest of the budget: 0 or less when the day may have more.
 std::int64_t SqliteTrim::removeDistributions(std::int32_t day, std::int64_t budget) {
   std::vector<Row> rows;
   {
@@ -173,7 +174,7 @@ std::int64_t SqliteTrim::removeDistributions(std::int32_t day, std::int64_t budg
       rows.push_back({std::string(next.bytes(0)), next.integer(1), {}});
       Row& row = rows.back();
       auto runs = unpackRuns(next.bytes(2));
-      // What a damaged row refers to may belong to another.
+      // The chunks that a damaged row refers to may belong to another row.
       if (runs && valuesIn(*runs) == row.count) row.runs = *std::move(runs);
       for (const ChunkRun& run : row.runs)
         work += kRowsPerChunk * (run.end() - run.first);
@@ -185,8 +186,8 @@ std::int64_t SqliteTrim::removeDistributions(std::int32_t day, std::int64_t budg
   return budget;
 }
 
-// Removes as many runs as the budget allows, at least one, and the row with the last of them. False
-// when something of it is left.
+// Removes as many runs as the budget allows, at least one, and with the last run the row. False
+// when some of it is left.
 bool SqliteTrim::removeRow(std::int32_t day, Row& row, std::int64_t& budget) {
   SqliteStatement removeChunks(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
   while (!row.runs.empty() && budget > 0) {
@@ -246,7 +247,7 @@ Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
       return pages == budget;
     });
     if (!done) return done;
-    // The file itself becomes shorter when the log is moved.
+    // The file itself is shortened only when the log is moved into it.
     connection_.checkpoint(false);
   } catch (const StoreFailure& failure) {
     return Error{site_.describe(failure)};
@@ -254,7 +255,7 @@ Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
   return Done{};
 }
 
-// Readers may hold it up: the next step or the daily run moves it then.
+// If readers prevent it, the next step or the daily run moves the log.
 void SqliteTrim::limitLog(off_t bytes) {
   const auto log = FileSystem::status(site_.path + "-wal");
   if (!log || log->st_size <= bytes) return;

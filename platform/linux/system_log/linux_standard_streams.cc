@@ -6,7 +6,7 @@
 namespace tavrel {
 namespace {
 
-// There is nowhere to report a failure.
+// Ignores failures: there is nowhere to report them.
 void writeAll(int descriptor, std::string_view text) {
   while (!text.empty()) {
     const ssize_t written = ::write(descriptor, text.data(), text.size());

@@ -57,8 +57,8 @@ void appendField(std::string& out, std::string_view name, std::string_view value
   out += '\n';
 }
 
-/// Adds text with its control characters, DEL and malformed bytes as "\xNN": names in messages come
-/// from outside, and a terminal would obey them.
+/// Adds text with its control characters, DEL and malformed bytes as "\xNN": messages contain names
+/// from outside, and a terminal would obey control characters.
 void appendPrintable(std::string& out, std::string_view text) {
   static constexpr char kDigits[] = "0123456789ABCDEF";
   while (true) {
@@ -82,7 +82,7 @@ void appendPrintable(std::string& out, std::string_view text) {
   }
 }
 
-/// The last place up to `at` that does not divide a character; `at` when the text is not UTF-8.
+/// The last offset up to `at` that does not split a character; `at` when the text is not UTF-8.
 std::size_t characterBoundary(std::string_view text, std::size_t at) {
   constexpr std::size_t kContinuationBytes = 3;
   for (std::size_t back = 0; back <= kContinuationBytes && back <= at; ++back) {
@@ -197,7 +197,7 @@ void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) con
   std::string_view continuation = "\n  ";
   std::string prefix;
   if (streamIsJournal_) {
-    // The journal takes the time from its own stamp and the level from this prefix of each line.
+    // The journal adds the time itself, and takes the level from this prefix of each line.
     prefix = {'\n', '<', names.priority, '>'};
     continuation = prefix;
     line = prefix.substr(1);
