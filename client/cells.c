@@ -10,15 +10,15 @@ static bool isClosed(uint32_t closes) {
   return closes % 2 != 0;
 }
 
-/* Closes a cell that is no longer used. The number differs each time, so that an acknowledgement of
- * an earlier close does not count for what was added since. */
+/* Closes a cell that is no longer used. The number is new each time, so that the acknowledgement of
+ * an earlier close does not cover later adds. */
 static void closeCell(struct Cell* cell) {
   uint32_t closes = atomic_load(&cell->closes);
   while (!atomic_compare_exchange_weak(&cell->closes, &closes, (closes + 1) | 1)) {
   }
 }
 
-/* False when the cell was given to another time in the meantime. */
+/* False when the cell was given another start in the meantime. */
 static bool reopen(struct Cell* cell, uint64_t start) {
   uint32_t closes = atomic_load(&cell->closes);
   while (isClosed(closes)) {
@@ -36,7 +36,7 @@ static bool reuse(struct Key* key, struct Cell* cell, uint64_t start) {
   return true;
 }
 
-/* A cell of the key for `start`, or one that the key no longer needs. */
+/* A cell of the key for `start`: an existing one, or an acknowledged one that is reused. */
 static struct Cell* findKnown(struct State* state, struct Segment* segment, struct Key* key,
                               uint32_t newest, uint64_t start) {
   for (uint32_t number = newest; number != 0; number = atomic_load(&state->older[number - 1])) {
@@ -50,7 +50,7 @@ static struct Cell* findKnown(struct State* state, struct Segment* segment, stru
   return NULL;
 }
 
-/* The number of a cell that was not used before; 0 when there is none. */
+/* The number of a cell that has never been used; 0 when there is none. */
 static uint32_t takeCell(struct Process* process, struct Segment* segment) {
   uint32_t used = atomic_load(&segment->cellsUsed);
   do {

@@ -29,7 +29,7 @@ void bhNoticeFold(struct Process* process, struct Segment* segment) {
   atomic_store_explicit(&state->knownFolds, folds, memory_order_relaxed);
 }
 
-/* A chunk whose records have been folded, emptied. */
+/* A chunk whose records have been folded, emptied for reuse. */
 static struct Chunk* takeReusable(struct State* state, struct Segment* segment) {
   if (atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) <= 0) return NULL;
   const uint32_t used = usedChunks(segment);
@@ -40,8 +40,8 @@ static struct Chunk* takeReusable(struct State* state, struct Segment* segment) 
     uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
     if (!isReusable(chunk) || generation % 2 != 0) continue;
     if (!atomic_compare_exchange_strong(&chunk->generation, &generation, generation + 1)) continue;
-    /* Nobody writes records here: every record of the generation is marked, and what threads
-     * reserve late lies beyond the end. The count that lets them in again comes last. */
+    /* Nobody writes records here now: every record of the generation is marked, and late
+     * reservations lie beyond the end. The count that lets writers in again is reset last. */
     for (uint32_t i = 0; i < kBHChunkRecords; ++i)
       atomic_store_explicit(&chunk->records[i].mark, 0, memory_order_relaxed);
     atomic_store_explicit(&chunk->generation, generation + 2, memory_order_release);
@@ -53,7 +53,7 @@ static struct Chunk* takeReusable(struct State* state, struct Segment* segment) 
   return NULL;
 }
 
-/* Fetches the memory of chunk `index`, and of some more when the process records much. */
+/* Allocates the memory of chunk `index`, and of some more chunks when the process records much. */
 static bool fetchChunk(struct State* state, struct Segment* segment, uint32_t index) {
   uint32_t fetched = atomic_load_explicit(&state->fetchedChunks, memory_order_relaxed);
   if (index < fetched) return true;
@@ -69,7 +69,7 @@ static bool fetchChunk(struct State* state, struct Segment* segment, uint32_t in
   return true;
 }
 
-/* A chunk that was not used before. */
+/* A chunk that has never been used. */
 static struct Chunk* takeFresh(struct State* state, struct Segment* segment) {
   uint32_t used = atomic_load_explicit(&segment->chunksUsed, memory_order_relaxed);
   do {
@@ -93,8 +93,8 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
   return chunk;
 }
 
-/* Keeps a chunk that was taken for a lane and is still empty. Of two, one is the spare chunk; the
- * other has nothing to fold, and so is acknowledged like one that was folded. */
+/* Keeps an empty chunk that was taken in vain for a lane. One becomes the spare chunk; an earlier
+ * spare has nothing to fold, so it is acknowledged as if it had been folded. */
 static void keepEmpty(struct State* state, struct Chunk* chunk) {
   chunk = atomic_exchange(&state->spareChunk, chunk);
   if (!chunk) return;

@@ -7,7 +7,7 @@
 
 #include "internal.h"
 
-/* System calls directly: the library's functions are points where a thread may be cancelled. */
+/* Direct system calls: the C library's functions are cancellation points. */
 static size_t readSmallFile(const char* path, char* text, size_t size) {
   const int file = (int)syscall(SYS_openat, AT_FDCWD, path, O_RDONLY | O_CLOEXEC);
   if (file < 0) return 0;
@@ -34,8 +34,8 @@ static void readBoot(unsigned char boot[16]) {
   }
 }
 
-/* Field 22 of /proc/self/stat. The second one is the program's name in parentheses, which may
- * hold anything. */
+/* Field 22 of /proc/self/stat. The second field, the program's name in parentheses, may contain
+ * anything. */
 static uint64_t startTime(void) {
   char text[1024];
   const size_t length = readSmallFile("/proc/self/stat", text, sizeof text);
@@ -55,7 +55,7 @@ static uint64_t startTime(void) {
 
 static void makeIdentity(unsigned char identity[16]) {
   if (getrandom(identity, 16, GRND_NONBLOCK) == 16) return;
-  /* Early after boot. Unique per user is enough. */
+  /* No random bytes yet, early after boot. The identity need only be unique per user. */
   struct timespec now = {0};
   clock_gettime(CLOCK_BOOTTIME, &now);
   const uint64_t parts[2] = {

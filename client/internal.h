@@ -15,27 +15,27 @@
 
 /* The library's memory; NULL before the first look-up, and when the kernel lacks a feature. */
 struct Process* bhProcess(void);
-/* The same, but creates missing memory. */
+/* The same, but creates the memory when it is missing. */
 struct Process* bhMakeProcess(void);
 
 /* keys.c */
 
-/* Names the key in the segment. Returns its number, or 0 without memory for it. */
+/* Names the key in the segment. Returns its number, or 0 when there is no memory for it. */
 uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key* key);
 bool bhWasKeyRefused(void);
-/* A place in the table of keys; refused handles have none. */
+/* Whether `key` is in the table of keys; the handle of refused keys is not. */
 bool bhIsKey(const struct Process* process, const struct Key* key);
 
 /* segment.c */
 
 /* The process's segment; begins one when there is none. NULL on failure, see `State.status`. */
 struct Segment* bhSegment(struct Process* process);
-/* In a child: lets go of the parent's segment, in which it must not write. */
+/* In a child: drops the parent's segment, to which it must not write. */
 void bhForgetParent(void);
-/* Ends a call that may have changed `State`: what it noted of a segment that is not this process's,
- * because a signal handler within the call made this child, is emptied again. */
+/* Ends a call that may have changed `State`. If a signal handler within the call forked this child,
+ * clears the state, which describes the parent's segment. */
 void bhForgetInterrupted(struct Process* process, const struct Segment* segment);
-/* Fetches memory, so that a full tmpfs shows here and not as SIGBUS. */
+/* Allocates the pages: on a full tmpfs this call fails, and no later access raises SIGBUS. */
 bool bhFetch(const void* from, size_t bytes);
 void bhAskForFold(struct Process* process);
 /* Counts a value for which there is no room. */
@@ -43,28 +43,29 @@ void bhDrop(struct Process* process, struct Segment* segment);
 
 /* segment_file.c */
 
-/* Makes, maps and describes a new segment; NULL with `status` when that fails. */
+/* Creates and maps a new segment and fills in its header; NULL with `status` on failure. */
 struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status);
 void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment);
-/* Replaces a mapping that the process inherited by empty memory of its own. */
+/* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);
 
 /* facts.c */
 
-/* Identifies the process for readers; fields that cannot be found out stay 0. */
+/* Identifies the process for readers; unknown fields stay 0. */
 void bhDescribeProcess(struct Segment* segment);
 
 /* cells.c */
 
-/* The cell of the key for what the clocks show; NULL, counted as dropped, when there is none. */
+/* The key's cell for the current day; NULL when there is none. A lack of room is counted as a
+ * dropped value. */
 struct Cell* bhFindCell(struct Key* key);
 
 /* chunks.c */
 
-/* Finds out which chunks the last fold has freed. */
+/* After a fold, counts the chunks that it has freed. */
 void bhNoticeFold(struct Process* process, struct Segment* segment);
-/* Records when the fast path cannot. */
+/* Records a value when the fast path cannot. */
 void bhRecordSlowly(struct Key* key, double value);
 
 /* Times. */

@@ -1,5 +1,5 @@
-/* The keys of the process. They are found without locks, so that a child of a process with threads
- * can look keys up too. Names live in static memory at the offsets that they have in segments. */
+/* The keys of the process. Look-ups take no locks, so that a child of a multithreaded process can
+ * look keys up too. Names are in static memory, at the same offsets as in segments. */
 #include <string.h>
 
 #include "internal.h"
@@ -9,7 +9,7 @@ enum { kBuckets = 2 * kBHKeys };
 static char names[kBHNamesBytes];
 static _Atomic uint32_t usedNames;
 static _Atomic uint32_t usedKeys;
-static uint64_t entries[kBHKeys];          /* as in segments */
+static uint64_t entries[kBHKeys];          /* in a segment's format */
 static _Atomic uint32_t buckets[kBuckets]; /* index + 1 */
 static _Atomic int wasKeyRefused;
 
@@ -37,7 +37,7 @@ static uint32_t hashOf(const char* name, uint32_t length, uint32_t kind) {
   return hash;
 }
 
-/* Takes `amount` of `limit`; returns where it begins, or `limit` when it does not fit. */
+/* Reserves `amount` out of `limit`; returns where it begins, or `limit` when it does not fit. */
 static uint32_t take(_Atomic uint32_t* used, uint32_t amount, uint32_t limit) {
   uint32_t start = atomic_load(used);
   do {
@@ -46,7 +46,7 @@ static uint32_t take(_Atomic uint32_t* used, uint32_t amount, uint32_t limit) {
   return start;
 }
 
-/* Index + 1 of a new key, or 0. */
+/* Adds a key; returns its index + 1, or 0 when there is no room. */
 static uint32_t addKey(const char* name, uint32_t length, uint32_t kind) {
   const uint32_t offset = take(&usedNames, length, kBHNamesBytes);
   if (offset == kBHNamesBytes) return 0;
@@ -62,7 +62,7 @@ static struct Key* refuse(void) {
   return &refusedKey;
 }
 
-/* 0 for an invalid name. */
+/* The length of a name, 0 for an invalid one. */
 static size_t lengthOfName(const char* name) {
   const size_t length = name ? strnlen(name, kBHLongestName + 1) : 0;
   if (length > kBHLongestName) return 0;
@@ -118,7 +118,7 @@ uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key*
       !bhFetch(&segment->keys[index], sizeof segment->keys[index])) {
     return 0;
   }
-  /* Threads that do this together write the same. */
+  /* Threads that do this at the same time write the same bytes. */
   for (uint32_t i = 0; i < lengthOf(entry); ++i)
     atomic_store_explicit(&to[i], from[i], memory_order_relaxed);
   atomic_store_explicit(&segment->keys[index], entry, memory_order_release);

@@ -1,4 +1,4 @@
-/* A mapped segment as structures, and the memory of the library. */
+/* Structures for a mapped segment, and for the library's own memory. */
 #ifndef BRIMHOLD_LAYOUT_H
 #define BRIMHOLD_LAYOUT_H
 
@@ -76,27 +76,27 @@ _Static_assert(sizeof(struct Segment) == kBHSegmentBytes, "");
 
 /* What a handle points to. All zero in a process that has not recorded under the key. */
 struct Key {
-  _Atomic(struct Cell*) cell;  /* where adds go while its day lasts */
-  _Atomic uint32_t newestCell; /* number of the cell made last; the others follow by `older` */
+  _Atomic(struct Cell*) cell;  /* where adds go until its day ends */
+  _Atomic uint32_t newestCell; /* number of the cell made last; `older` leads to the others */
   _Atomic uint32_t number;     /* the key's number in marks; 0 until the segment names the key */
 };
 
-/* A chunk that some threads fill. On a cache line of its own. */
+/* A chunk that one or more threads fill, on a cache line of its own. */
 struct Lane {
   alignas(64) _Atomic(struct Chunk*) chunk;
 };
 
-/* Memory that the kernel empties in a child (MADV_WIPEONFORK): a child begins without a segment,
- * and no call has to check whether it runs in one. */
+/* Memory that the kernel clears in a child (MADV_WIPEONFORK): a child begins without a segment, and
+ * no call has to check whether it runs in a child. */
 struct State {
   _Atomic(struct Segment*) segment;
   _Atomic uint64_t retryAt; /* no segment is begun before these CLOCK_MONOTONIC seconds */
   _Atomic int status;       /* why there is none */
   _Atomic uint32_t nextLane;
-  _Atomic(struct Chunk*) spareChunk; /* opened, but another thread was faster */
-  _Atomic uint32_t fetchedChunks;    /* chunks whose memory is there */
-  _Atomic uint64_t knownFolds;       /* the segment's folds when reusable chunks were counted */
-  _Atomic int32_t reusableChunks;    /* about how many a fold has acknowledged */
+  _Atomic(struct Chunk*) spareChunk; /* taken, but another thread was faster */
+  _Atomic uint32_t fetchedChunks;    /* chunks whose memory is allocated */
+  _Atomic uint64_t knownFolds;       /* the segment's folds at the last count of reusable chunks */
+  _Atomic int32_t reusableChunks;    /* approximate number that folds have acknowledged */
   _Atomic uint32_t nextReusable;     /* where to look for one */
   _Atomic int isFull;
   _Atomic int askedForFold;
@@ -105,7 +105,7 @@ struct State {
   _Atomic uint16_t older[kBHCellCount]; /* number of the same key's next older cell; 0 is none */
 };
 
-/* Memory whose content children share. */
+/* Memory that children inherit with its content. */
 struct Process {
   struct State* state;
   _Atomic(struct Segment*) mapped; /* the segment of this process, or of its parent */

@@ -1,5 +1,5 @@
-/* Every bound of the library, with its unit and its reason. segment_format.h has the sizes of a
- * segment's parts. */
+/* Every bound of the library, with its unit and its reason. The sizes of a segment's parts are in
+ * segment_format.h. */
 #ifndef BRIMHOLD_LIMITS_H
 #define BRIMHOLD_LIMITS_H
 
@@ -11,20 +11,20 @@ enum {
    * slower. Each costs a page once used. */
   kLanes = 64,
 
-  /* Chunks whose memory is fetched at once: amortises the system call, and bounds what a process
-   * with few records takes. */
+  /* Chunks whose memory is allocated at once: amortises the system call, and bounds the memory of a
+   * process with few records. */
   kLargestFetch = 16,
 
-  /* Seconds until a segment that could not be begun is tried again: a program that starts before
-   * the folder exists records soon, and one without a folder pays a clock read per value. */
+  /* Seconds until the next attempt to begin a segment after a failure: a program that starts before
+   * the folder exists soon records, and one without a folder pays only a clock read per value. */
   kRetrySeconds = 5,
 
   /* Segments in the folder beyond which a new one asks for a fold: short-lived processes leave
    * one each, of 20 KiB. */
   kSegmentsBeforeFold = 256,
 
-  /* Names tried for a new file. They hold a time in nanoseconds; a collision means that a process
-   * of another PID namespace began in the same one. */
+  /* Names tried for a new file. They contain a time in nanoseconds; a collision means that a
+   * process in another PID namespace began in the same nanosecond. */
   kNameAttempts = 8
 };
 

@@ -18,19 +18,19 @@ static void* mapMemory(size_t bytes) {
 
 static bool findFolder(char folder[kLongestFolder]) {
   static const char kFolder[] = "/run/tavrel/stat";
-  /* A program that runs with more rights than its caller does not take paths from the caller. */
+  /* A program that runs with more rights than its caller must not take paths from the caller. */
   const char* root = secure_getenv("TAVREL_ROOT");
   size_t length = root ? strlen(root) : 0;
   while (length > 0 && root[length - 1] == '/')
     --length;
   if (length + sizeof kFolder > kLongestFolder) return false;
-  /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): the next copy has the zero */
+  /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): the next copy appends the zero */
   if (length > 0) memcpy(folder, root, length);
   memcpy(folder + length, kFolder, sizeof kFolder);
   return true;
 }
 
-/* When this fails, a child lets go of its parent's segment with its first value. */
+/* If this fails, a child drops its parent's segment only at its first value. */
 __attribute__((constructor)) static void registerForForks(void) {
   pthread_atfork(NULL, NULL, bhForgetParent);
 }

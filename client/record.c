@@ -1,7 +1,7 @@
 #include "record.h"
 
-/* The current cell, if its day lasts. Undated cells never pass: their start is far in the future.
- */
+/* The current cell, until its day ends. Undated cells never qualify: their start is in the far
+ * future. */
 static inline struct Cell* cellOfToday(struct Key* key) {
   struct Cell* cell = atomic_load_explicit(&key->cell, memory_order_acquire);
   if (!cell) return NULL;
@@ -22,7 +22,7 @@ void BHClientScalarAdd(BHClientScalarKey* handle, int64_t amount) {
   struct Cell* cell = cellOfToday(key);
   if (!cell) cell = cellFor(key);
   if (!cell) return;
-  /* A set between the two lines replaces the add; after a second set the add comes last. */
+  /* A set between these two lines replaces the add; after two sets, the add comes on top. */
   const uint64_t sets = atomic_load_explicit(&cell->sets, memory_order_acquire);
   atomic_fetch_add_explicit(&cell->slots[sets % 2], amount, memory_order_relaxed);
 }

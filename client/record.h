@@ -6,11 +6,11 @@
 
 #include "internal.h"
 
-/* Within the memory that every thread has from its start: a signal handler may be the first to
- * look at it, and must not allocate. */
+/* In the memory that every thread has from its start: the first access may be in a signal handler,
+ * which must not allocate. */
 #define BH_CLIENT_THREAD_LOCAL __attribute__((tls_model("initial-exec")))
 
-/* The chunk that the thread fills. Stays valid in children, where its content is empty. */
+/* The lane of this thread. Stays valid in children, where it is empty. */
 extern _Thread_local struct Lane* bhLane BH_CLIENT_THREAD_LOCAL;
 
 static inline uint64_t bhMark(uint32_t number, uint64_t time) {

@@ -3,8 +3,8 @@
 
 #include "internal.h"
 
-/* A child lets go of its parent's segment, which can then be retired. Memory stays in its place:
- * the child may have been made by a signal handler within a record, and returns there. */
+/* A child replaces its parent's segment with empty memory, so that the segment can be retired. The
+ * addresses stay valid: a signal handler may have forked within a record, and will return there. */
 static void forgetInherited(struct Process* process, struct Segment* inherited) {
   if (inherited && atomic_compare_exchange_strong(&process->mapped, &inherited, NULL)) {
     bhForgetMapping(inherited);
@@ -15,7 +15,7 @@ void bhForgetParent(void) {
   struct Process* process = bhProcess();
   if (!process) return;
   struct Segment* mapped = atomic_load(&process->mapped);
-  /* Another library's handler may have recorded in the child already. */
+  /* Another library's fork handler may have recorded in the child already. */
   if (!atomic_load(&process->state->segment)) forgetInherited(process, mapped);
 }
 
@@ -34,8 +34,8 @@ static struct Segment* begin(struct Process* process, uint64_t now) {
     atomic_store_explicit(&state->retryAt, now + kRetrySeconds, memory_order_relaxed);
     return atomic_load_explicit(&state->segment, memory_order_acquire);
   }
-  /* No thread waits here for another, or for the code that a signal handler interrupted: each
-   * begins a segment, and one of them stays. */
+  /* No thread waits here for another, or for the code that a signal handler has interrupted: each
+   * begins a segment, and only one is kept. */
   struct Segment* known = NULL;
   if (atomic_compare_exchange_strong_explicit(&state->segment, &known, begun, memory_order_acq_rel,
                                               memory_order_acquire)) {
@@ -56,7 +56,7 @@ struct Segment* bhSegment(struct Process* process) {
   const uint64_t now = bhSeconds(CLOCK_MONOTONIC_COARSE);
   if (now < atomic_load_explicit(&state->retryAt, memory_order_relaxed)) return NULL;
 
-  /* A child that a signal handler made here would return to share the segment. */
+  /* A child forked here by a signal handler would return here and share the segment. */
   sigset_t all, before;
   sigfillset(&all);
   pthread_sigmask(SIG_SETMASK, &all, &before);

@@ -14,7 +14,7 @@
 #define MADV_POPULATE_WRITE 23
 #endif
 
-/* System calls directly: the library's functions are points where a thread may be cancelled. */
+/* Direct system calls: the C library's functions are cancellation points. */
 static int openFile(int folder, const char* name, int flags, int mode) {
   return (int)syscall(SYS_openat, folder, name, flags | O_CLOEXEC, mode);
 }
@@ -37,7 +37,7 @@ static BHClientStatus statusOf(int error) {
     case ENOMEM:
     case EMFILE:
     case ENFILE:
-    case EFAULT: /* memory that could not be fetched */
+    case EFAULT: /* memory could not be allocated */
       return BHClientStatusNoSpace;
     default:
       return BHClientStatusFailed;
@@ -78,7 +78,7 @@ void bhPostFoldWanted(const char* folder) {
   closeFile(directory);
 }
 
-/* Growing a file beyond this limit would raise SIGXFSZ. */
+/* Checked first, since growing a file beyond the limit would raise SIGXFSZ. */
 static bool mayMakeFilesThatLarge(void) {
   struct rlimit limit;
   return getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur >= kBHSegmentBytes;
@@ -95,7 +95,7 @@ static struct Segment* mapSegment(int file) {
   struct Segment* segment = memory;
 
   bool isThere = madvise(segment, kBHKeyTable, MADV_POPULATE_WRITE) == 0;
-  /* Before Linux 5.14 memory is only fetched through the file, so all of it now. */
+  /* Before Linux 5.14, memory can be allocated only through the file, so allocate all of it now. */
   if (!isThere && errno == EINVAL) {
     isThere = syscall(SYS_fallocate, file, 0, (off_t)0, (off_t)kBHSegmentBytes) == 0;
   }
@@ -153,7 +153,7 @@ struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus
     *status = BHClientStatusNotInMemory;
   } else {
     segment = beginIn(directory, name, status);
-    /* The size of a folder of a tmpfs is 20 bytes per entry. */
+    /* On a tmpfs, the size of a folder is 20 bytes per entry. */
     if (fstat(directory, &entries) == 0 && entries.st_size / 20 > kSegmentsBeforeFold) {
       bhPostFoldWanted(folder);
     }

@@ -8,27 +8,27 @@
  * Build with `pkg-config --cflags --libs brimhold`.
  *
  * Purpose. A scalar is a number per UTC day: counts are added, gauges are set. A distribution is a
- * series of measurements, each kept with its second. The system folds what programs record into
- * its statistics store, every hour and when a segment fills up, and reports what its whitelist
+ * series of measurements, each kept with its second. The system folds recorded values into its
+ * statistics store, every hour and when a segment fills up, and reports the keys that its whitelist
  * names. `tavrelctl stat show KEY` shows a value right away.
  *
- * Cost. An add or a record is a few nanoseconds: a clock read and an atomic add in memory. There
- * is no daemon, no lock and no write to flash. A process that records takes 20 KiB of memory, and
- * at most 4 MiB. Now and then, when a page fills up or a day begins, a call makes a system call.
+ * Cost. An add or a record is a few nanoseconds: a clock read and an atomic add in memory. There is
+ * no daemon, no lock and no write to flash. A process that records takes 20 KiB of memory, and at
+ * most 4 MiB. Calls make system calls only now and then, as when a page fills up or a day begins.
  *
  * Guarantees.
  *  - No call reports a failure, waits for another thread or process, allocates from the heap,
- *    changes errno or raises a signal. Where recording is impossible the calls do nothing;
+ *    changes errno or raises a signal. When recording is impossible, the calls do nothing;
  *    BHClientGetStatus says why.
  *  - Every call but the two look-ups may be made in a signal handler, and all of them from any
  *    thread. Handles live as long as the process and stay valid in children.
- *  - What was recorded before the process ended, however it ended, is folded exactly once. A power
- *    cut loses what was recorded since the last fold.
+ *  - Values recorded before the process ended, however it ended, are folded exactly once. A power
+ *    cut loses the values recorded since the last fold.
  *  - A value belongs to the UTC day that the clock showed (CLOCK_REALTIME_COARSE, which lags by
  *    some milliseconds). While the clock is older than this library, as on a device that has just
  *    started without a battery clock, values are dated once it has been set.
- *  - A set replaces what this process added or set earlier that day; of sets by two processes the
- *    later one counts.
+ *  - A set replaces what this process added or set earlier that day; when two processes set a
+ *    scalar, the later set counts.
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
