@@ -7,7 +7,7 @@
 namespace tavrel {
 namespace {
 
-// 0 when there is none.
+// The positive number in an environment variable; 0 when there is none.
 int positiveNumberFrom(const char* variable) {
   const char* const text = std::getenv(variable);
   if (text == nullptr) return 0;

@@ -15,7 +15,7 @@ constexpr std::int64_t wrappingSubtract(std::int64_t a, std::int64_t b) {
   return static_cast<std::int64_t>(static_cast<std::uint64_t>(a) - static_cast<std::uint64_t>(b));
 }
 
-/// The day before, in two's complement: the day before the first 32-bit day is the last one.
+/// The previous day, in two's complement: the last 32-bit day precedes the first one.
 constexpr std::int32_t previousDay(std::int32_t day) {
   return static_cast<std::int32_t>(static_cast<std::uint32_t>(day) - 1U);
 }

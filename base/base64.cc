@@ -9,7 +9,7 @@ namespace {
 constexpr std::string_view kDigits =
     "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
 
-// A value with a bit above the six is not a digit.
+// Digits have values of six bits; the other kinds of characters have higher bits.
 constexpr std::uint8_t kSpace = 0x40;
 constexpr std::uint8_t kPadding = 0x80;
 constexpr std::uint8_t kForeign = 0xC0;
@@ -31,9 +31,9 @@ std::byte* putGroup(std::uint32_t group, std::byte* end) {
   return end;
 }
 
-// Takes the groups of four digits at the front of the text.
+// Takes whole groups of four digits from the front of the text.
 std::byte* takeGroups(std::string_view& text, std::byte* end) {
-  std::string_view rest = text;  // a copy, which the bytes that are written cannot overlap
+  std::string_view rest = text;  // a copy: the bytes written cannot alias it
   while (rest.size() >= 4) {
     const auto value = [rest](std::size_t i) -> std::uint32_t {
       return kValues[static_cast<unsigned char>(rest[i])];

@@ -1,7 +1,7 @@
-// Checked access to byte buffers from outside.
+// Bounds-checked access to byte buffers from outside.
 //
-// A load takes the buffer and an offset, and yields nothing when the value would not lie wholly
-// inside. Offsets are 64-bit, so that no sum of 32-bit fields can wrap before it is checked.
+// A load takes the buffer and an offset, and returns nothing when the value is not wholly inside.
+// Offsets are 64-bit, so that no sum of 32-bit fields can wrap before it is checked.
 #pragma once
 
 #include <bit>
@@ -29,7 +29,7 @@ namespace bytes_detail {
 
 template <class Word>
 constexpr Word assembleLittle(const std::byte* at) {
-  // Compilers do not make one load of the loop.
+  // Compilers do not turn the loop into one load.
   if (!std::is_constant_evaluated() && std::endian::native == std::endian::little) {
     Word whole;
     std::memcpy(&whole, at, sizeof whole);
@@ -87,7 +87,7 @@ constexpr std::optional<std::uint64_t> loadLittle64(ByteSpan bytes, std::uint64_
   return bytes_detail::loadLittle<std::uint64_t>(bytes, offset);
 }
 
-/// In the order of this machine, for memory that programs on it share.
+/// In this machine's byte order, for memory that programs on it share.
 inline std::optional<std::uint32_t> loadNative32(ByteSpan bytes, std::uint64_t offset) {
   return bytes_detail::loadNative<std::uint32_t>(bytes, offset);
 }

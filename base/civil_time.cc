@@ -11,7 +11,7 @@ namespace {
 constexpr std::int64_t kDaysPerEra = 146097;
 constexpr std::int64_t kDaysFromEraStartTo1970 = 719468;  // 0000-03-01 to 1970-01-01
 
-// Years beyond these would overflow the seconds of a 64-bit instant.
+// Larger years would overflow an instant in 64-bit seconds.
 constexpr std::int64_t kLargestYear = 1'000'000'000;
 
 constexpr std::int64_t floorDivide(std::int64_t a, std::int64_t b) {
@@ -59,7 +59,7 @@ CivilTime civilFromSeconds(std::int64_t seconds) {
 }
 
 std::int64_t secondsFromCivil(const CivilTime& time) {
-  // The first day of the 64-bit range is not wholly inside it.
+  // Unsigned, because the first day of the 64-bit range is only partly inside it.
   const auto days = static_cast<std::uint64_t>(daysFromCivil(time.date));
   return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600ULL +
                                    time.minute * 60ULL + time.second);

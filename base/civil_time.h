@@ -19,7 +19,7 @@ struct CivilDate {
   bool operator==(const CivilDate&) const = default;
 };
 
-/// A date with the time of day in UTC.
+/// A date with a time of day, in UTC.
 struct CivilTime {
   CivilDate date;
   unsigned hour;
@@ -40,7 +40,7 @@ std::int64_t secondsFromCivil(const CivilTime& time);
 /// Seconds since midnight UTC, for any 64-bit instant.
 unsigned secondOfDay(std::int64_t seconds);
 
-/// True for a date that the calendar has.
+/// True for a date that exists in the calendar.
 bool isValid(const CivilDate& date);
 
 /// "2026-11-16"; years outside 0 to 9999 are written in full, with their sign when negative.

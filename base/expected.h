@@ -1,4 +1,4 @@
-// The outcome of an operation that yields a value or says why it could not.
+// The outcome of an operation: a value, or the reason why there is none.
 #pragma once
 
 #include <string>
@@ -7,7 +7,7 @@
 
 namespace tavrel {
 
-/// A reason for people to read: what failed, where, and the system's own words if there are any.
+/// A reason for people to read: what failed, where, and the system's own error text, if any.
 struct Error {
   std::string message;
 };
@@ -33,7 +33,7 @@ class [[nodiscard]] Expected {
   std::variant<T, Error> state_;
 };
 
-/// The outcome of an operation that yields no value.
+/// The outcome of an operation without a value.
 struct Done {};
 using Status = Expected<Done>;
 

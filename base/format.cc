@@ -13,13 +13,13 @@
 namespace tavrel {
 namespace {
 
-// What to do with a width or precision from an argument that exceeds the limit.
+// What to do when a width or precision from an argument exceeds the limit.
 enum class Excess { Clamp, Refuse };
 
 // The longest text of a double: 309 digits before the point, the point, and the decimals.
 constexpr std::size_t kDoubleText = limits::kLargestFormatWidth + 320;
 
-// How much of a wrong directive an error quotes, in bytes.
+// How many bytes of a wrong directive an error quotes.
 constexpr std::size_t kQuotedDirective = 40;
 
 std::size_t paddingOf(const Directive& directive, std::size_t length) {
@@ -122,7 +122,7 @@ void appendInteger(std::string& out, const Directive& directive, std::uint64_t b
   }
 }
 
-// The C library's digits of a positive number. Without a precision the library chooses it.
+// The C library's digits of a positive number. Without a precision, the library's default applies.
 template <std::size_t Size>
 std::string_view digitsOf(char (&text)[Size], const Directive& directive, double value) {
   const int precision = directive.precision.value_or(-1);
@@ -298,7 +298,7 @@ class Engine {
     return static_cast<std::int32_t>(std::get<std::uint32_t>(argument->value()));
   }
 
-  // Limits a width or precision from an argument, or fails.
+  // Clamps or refuses a width or precision from an argument that is too large.
   bool limit(std::int64_t& size) {
     if (size <= limits::kLargestFormatWidth) return true;
     if (excess_ == Excess::Refuse) {
@@ -327,7 +327,7 @@ class Engine {
     if (!star) return false;
     if (*star < 0) return true;
     std::int64_t precision = *star;
-    // The precision of a text only shortens it, so a literal of ours may give any.
+    // The precision of a text only shortens it, so our own literals may use any.
     const bool shortens = directive.conversion == 's' || directive.conversion == '@';
     if (!(shortens && excess_ == Excess::Clamp) && !limit(precision)) return false;
     directive.precision = static_cast<std::int32_t>(precision);

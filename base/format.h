@@ -3,9 +3,9 @@
 //   std::string line = format("daily tasks for day %d", day);
 //   appendFormat(out, "%{public}@: %5.2f", object, value);
 //
-// The compiler checks format literals against their arguments. Format texts that a device supplies
-// go through `appendForeignFormat`, which refuses a text that needs arguments other than those
-// given. No missing argument is ever read.
+// The compiler checks format literals against their arguments. Format texts from a device go
+// through `appendForeignFormat`, which refuses a text that needs other arguments than those given.
+// No missing argument is ever read.
 //
 // Beyond C: "%@" prints an object's text (base/text.h), "(null)" for a null one, with width and
 // precision in bytes as for "%s"; not-a-number has no sign; a null text prints "(null)" whatever
@@ -116,8 +116,7 @@ using FormatOf = CheckedFormat<std::type_identity_t<Arguments>...>;
 
 /// Appends the formatted text. On failure it appends nothing, and the error says which directive is
 /// wrong and why. The limit on widths and precisions (limits::kLargestFormatWidth) also holds when
-/// they come from an argument, so that the length of the text stays in proportion to the number of
-/// arguments.
+/// they come from an argument, so that the arguments' number bounds the length of the text.
 Status appendForeignFormat(std::string& out, std::string_view format,
                            std::span<const FormatArgument> arguments);
 
@@ -126,7 +125,8 @@ void appendChecked(std::string& out, std::string_view format,
                    std::span<const FormatArgument> arguments);
 }  // namespace format_detail
 
-/// Appends the formatted text of a literal. A width from an argument is cut to the limit.
+/// Appends the formatted text of a literal. A width or precision from an argument is clamped to the
+/// limit.
 template <class... Arguments>
 void appendFormat(std::string& out, FormatOf<Arguments...> text, const Arguments&... arguments) {
   const std::array<FormatArgument, sizeof...(Arguments)> list{FormatArgument(arguments)...};

@@ -114,9 +114,10 @@ constexpr void takeLength(std::string_view& text, Directive& directive) {
 
 }  // namespace format_detail
 
-/// Takes one directive off the front of `text`, which begins after the "%". Nothing when the
-/// directive is incomplete, has an unknown conversion ("%n" is one), or a width beyond the limit;
-/// `text` then begins with the wrong character, or is empty when the directive is incomplete.
+/// Takes one directive from the front of `text`, which begins after the "%". Nothing when the
+/// directive is incomplete, or has an unknown conversion (such as "%n") or a width beyond the
+/// limit; `text` then begins at the offending character, or is empty when the directive is
+/// incomplete.
 constexpr std::optional<Directive> takeDirective(std::string_view& text) {
   using namespace format_detail;
   Directive directive;

@@ -14,7 +14,7 @@ namespace {
 
 constexpr auto kEpoch = static_cast<std::int64_t>(plist::Date::kEpoch);
 
-// Seconds from the epoch to the ends of the calendar of base/civil_time.h, rounded up.
+// The range of the calendar in base/civil_time.h, in seconds either side of the epoch, rounded up.
 constexpr double kLargestSeconds = 3.2e16;
 
 // Two digits at `position` that do not exceed `largest`.
@@ -25,7 +25,7 @@ std::optional<unsigned> parseTwoDigits(std::string_view text, std::size_t positi
   return value;
 }
 
-// A point and digits, as a part of a second.
+// A fraction of a second: a point and digits.
 std::optional<double> parseFraction(std::string_view text) {
   if (text.find_first_not_of("0123456789", 1) != std::string_view::npos) return std::nullopt;
   return parseNumber<double>(text);

@@ -1,4 +1,4 @@
-// Instants as ISO 8601 writes them, in UTC.
+// Instants in ISO 8601 format, in UTC.
 #pragma once
 
 #include <optional>
@@ -11,18 +11,18 @@
 namespace tavrel {
 
 /// Appends "2026-11-16T18:02:18Z", rounded down to the second. False, and nothing appended, for an
-/// instant that no calendar reaches (base/civil_time.h).
+/// instant outside the calendar (base/civil_time.h).
 bool appendIsoInstant(std::string& out, plist::Date instant);
 
 /// Reads the form that `appendIsoInstant` writes.
 std::optional<plist::Date> parseIsoInstant(std::string_view text);
 
-/// The same with the fraction of a second, when there is one: "2026-11-16T18:02:18.25Z". Instants
-/// that no calendar reaches as "@" and seconds since 1970.
+/// The same with a fraction of a second, if there is one: "2026-11-16T18:02:18.25Z". Instants
+/// outside the calendar are "@" and seconds since 1970.
 std::string isoDateText(plist::Date instant);
 
-/// Reads the forms that `isoDateText` writes, and a date alone, "2026-11-16". The error says what
-/// is expected.
+/// Reads the forms that `isoDateText` writes, and plain dates, "2026-11-16". The error says what is
+/// expected.
 Expected<plist::Date> parseIsoDate(std::string_view text);
 
 }  // namespace tavrel

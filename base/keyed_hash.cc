@@ -44,7 +44,7 @@ struct SipState {
 
 std::uint64_t wordAt(const char* at, std::size_t length) {
   std::uint64_t word = 0;
-  if (length != 0) std::memcpy(&word, at, length);  // the empty text may have no address
+  if (length != 0) std::memcpy(&word, at, length);  // an empty text may have a null pointer
   return word;
 }
 

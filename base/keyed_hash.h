@@ -1,4 +1,4 @@
-// Hashing of texts that come from outside.
+// Hashing of text from outside.
 #pragma once
 
 #include <cstddef>
@@ -11,10 +11,10 @@ struct HashKey {
   std::uint64_t low, high;
 };
 
-/// SipHash-1-3. Values differ between orders of bytes.
+/// SipHash-1-3. Values differ between byte orders.
 std::uint64_t sipHash(std::string_view text, const HashKey& key);
 
-/// Under a key drawn once per process: the author of the texts cannot make them collide. Values
+/// Uses a random key per process, so that the author of the texts cannot make them collide. Values
 /// differ from process to process and must not decide any order.
 std::uint64_t keyedHash(std::string_view text);
 

@@ -1,4 +1,4 @@
-// Numbers from texts that consist of nothing else.
+// Parses texts that consist of one number only.
 #pragma once
 
 #include <charconv>
@@ -9,8 +9,8 @@
 
 namespace tavrel {
 
-/// The integer that the whole text is, in digits of `base` without a prefix; only signed kinds take
-/// a minus sign. Nothing when there is anything else in the text or the number does not fit.
+/// The text as an integer, in digits of `base` without a prefix; only signed types accept a minus
+/// sign. Nothing when the text contains anything else or the number does not fit.
 template <std::integral Number>
 std::optional<Number> parseNumber(std::string_view text, int base = 10) {
   Number number{};

@@ -6,14 +6,14 @@
 // (one level) or `deepCopy`. Strings are immutable.
 //
 // `Dictionary`, `Array` and `Data` are typed handles on such a container. A handle may be empty. A
-// look-up through an empty handle yields nothing, and so does a look-up of something that is absent
-// or of another type, so look-ups chain:
+// look-up through an empty handle, or of a value that is absent or of another type, yields nothing,
+// so look-ups can be chained:
 //
 //   if (const auto unit = channel.dictionary("Info").number("Unit")) use(unit->int64());
 //
-// Writing through an empty handle first gives it a container of its own. `Array{}` is an empty
-// handle, and so null as a value; a container without elements is `Array::create()`. Dictionaries
-// enumerate in the order of insertion; add and remove nothing during an enumeration.
+// Writing through an empty handle first creates a container for it. `Array{}` is an empty handle,
+// and so a null value; an array without elements is `Array::create()`. Dictionaries enumerate in
+// the order of insertion. Do not add or remove entries during an enumeration.
 //
 // Do not share any of this between threads.
 #pragma once
@@ -128,7 +128,7 @@ struct DictionaryRep;
 struct ArrayRep;
 struct DataRep;
 
-/// The beginning of strings and containers. The count is not atomic.
+/// The common head of strings and containers. The reference count is not atomic.
 struct Shared {
   explicit Shared(Kind kindOfRep) : kind(kindOfRep) {}
   std::uint32_t references = 0;
@@ -228,7 +228,7 @@ class Dictionary {
   Array array(std::string_view key) const;
   Data data(std::string_view key) const;
 
-  /// Stores `value` in place of an earlier value of the key. A null value removes the key.
+  /// Stores `value`, replacing an earlier value of the key. A null value removes the key.
   void set(std::string_view key, Value value);
   /// The same, sharing the key's text.
   template <std::same_as<String> Key>

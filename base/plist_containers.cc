@@ -12,7 +12,7 @@ namespace tavrel::plist {
 namespace detail {
 namespace {
 
-// Up to here a walk over the entries is as fast as a table, and smaller.
+// Up to this size, a walk over the entries is as fast as a table, and needs less memory.
 constexpr std::size_t kLargestUnindexed = 16;
 
 std::uint32_t hashOf(std::string_view key) {
@@ -108,7 +108,7 @@ void DictionaryRep::compact() {
     place({hashOf(entries[i].key), i + 1});
 }
 
-// Makes room for the last entry, which is not placed yet, and as many as are reserved.
+// Makes room for the last entry, which is not placed yet, and for the reserved entries.
 void DictionaryRep::grow() {
   std::vector<Slot> old(slotsFor(std::max(entries.size(), entries.capacity() / 2)));
   old.swap(slots_);

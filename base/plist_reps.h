@@ -1,4 +1,4 @@
-// What the handles of base/plist.h point to. For the value implementation only.
+// The objects behind the handles of base/plist.h. For the implementation of values only.
 #pragma once
 
 #include <cstddef>
@@ -27,9 +27,9 @@ struct ArrayRep : Shared {
 };
 
 /// Entries in the order of insertion. A removed entry stays, with a null value, until half of the
-/// entries are removed ones. Small dictionaries are searched from the front; larger ones have an
-/// open-addressing table of entry numbers. The table keeps the keys' hashes, so that it grows
-/// without hashing them again and a look-up mostly compares one key.
+/// entries are removed. Small dictionaries are searched from the front; larger ones have an
+/// open-addressing table of entry numbers. The table stores the keys' hashes, so that it can grow
+/// without rehashing and a look-up usually compares one key.
 struct DictionaryRep : Shared {
   DictionaryRep() : Shared(Kind::Dictionary) {}
 

@@ -27,7 +27,7 @@ std::string sizeText(double bytes) {
   constexpr std::string_view kUnits[] = {"bytes", "KiB", "MiB", "GiB", "TiB", "PiB", "EiB"};
   if (bytes == 1) return "1 byte";
   std::size_t unit = 0;
-  // What would round to 1024.0 is shown in the next unit.
+  // A value that would round to 1024.0 is shown in the next unit.
   for (double next = 1024; std::abs(bytes) >= next && unit + 1 < std::size(kUnits); ++unit) {
     bytes /= 1024;
     next = 1023.95;

@@ -1,4 +1,4 @@
-// Figures with a unit, as text for people. JSON has them exactly.
+// Figures with a unit, rounded, as text for people; JSON output has exact figures.
 #pragma once
 
 #include <cstdint>
@@ -11,7 +11,7 @@ namespace tavrel {
 std::string sizeText(double bytes);
 
 /// At most three significant digits, with a prefix from pico to tera: "12.5 ms", "2.4 GHz". Seconds
-/// have no prefix above one, degrees ("°C") none at all.
+/// have no prefix for values above one, degrees ("°C") none at all.
 std::string quantityText(double value, std::string_view unit);
 
 /// "9.1 %" for a share of 0.0908.

@@ -12,10 +12,10 @@ namespace {
 
 using plist::Kind;
 
-// Up to here every integer is a double, so that its digits read back to it.
+// Up to this number every integer is exact as a double, so its digits read back to it.
 constexpr double kLargestPlainInteger = 9007199254740992.0;
 
-// The calendar arithmetic does not cover dates beyond.
+// The calendar arithmetic does not cover later dates.
 constexpr double kLargestSeconds = 3e16;
 
 template <class Integer>

@@ -1,8 +1,8 @@
-// The text of values as people and the receiving side read it.
+// Values as text for people and for the receivers of logs.
 //
 // Strings and numbers are plain, booleans are 1 and 0, dates "2026-11-16 18:02:18 +0000", data
-// hexadecimal in angle brackets. Containers are on one line in JSON's manner, with strings, dates
-// and data quoted. A null object is "(null)".
+// hexadecimal in angle brackets. Containers are on one line, as in JSON, with strings, dates and
+// data quoted. A null object is "(null)".
 #pragma once
 
 #include <cstdint>
@@ -19,14 +19,14 @@ namespace tavrel {
 std::string numberText(double value);
 std::string numberText(const plist::Number& value);
 
-/// "2026-11-16 18:02:18 +0000", in UTC, without fractions of a second. Instants beyond the calendar
-/// are "@" and the number of seconds since 1970.
+/// "2026-11-16 18:02:18 +0000", in UTC, without fractions of a second. Instants outside the
+/// calendar are "@" and the number of seconds since 1970.
 std::string dateText(plist::Date date);
 
-/// Lower-case hexadecimal, two digits a byte.
+/// Appends lower-case hexadecimal, two digits per byte.
 void appendHex(std::string& out, ByteSpan bytes);
 
-/// `text` between quotation marks, escaped as JSON does; malformed UTF-8 is repaired.
+/// Appends `text` in quotation marks, escaped as in JSON; malformed UTF-8 is repaired.
 void appendQuoted(std::string& out, std::string_view text);
 
 void appendText(std::string& out, const plist::Value& value);

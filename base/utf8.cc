@@ -16,7 +16,7 @@ struct Decoded {
   std::size_t length;
 };
 
-/// Of the sequence that a lead byte of 0x80 or more begins.
+/// The length of the sequence that a lead byte of 0x80 or more begins.
 std::size_t lengthAfter(unsigned char lead) {
   if (lead >= 0xF0) return 4;
   return lead >= 0xE0 ? 3 : 2;

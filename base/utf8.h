@@ -16,8 +16,8 @@ char32_t takeCodePoint(std::string_view& text);
 /// True when `text` is well-formed UTF-8 (shortest forms, no surrogates).
 bool isValidUtf8(std::string_view text);
 
-/// Invisible characters that change the direction of the text around them: one name could look like
-/// another.
+/// True for invisible characters that change the direction of surrounding text, with which one name
+/// could look like another.
 bool changesDirection(char32_t codePoint);
 
 constexpr bool isPrintableAscii(char character) {

@@ -13,7 +13,7 @@ using UuidBytes = std::array<std::byte, 16>;
 
 std::string uuidText(const UuidBytes& bytes);
 
-/// The same UUID in upper case; nothing for other texts.
+/// The UUID in `text`, in upper case; nothing when it is no UUID.
 std::optional<std::string> normalisedUuid(std::string_view text);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The version of tavrel, which CMakeLists.txt of the top folder states.
+// The version of tavrel, as set in the top-level CMakeLists.txt.
 #pragma once
 
 #include <string_view>
