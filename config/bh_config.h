@@ -1,7 +1,7 @@
 // The whitelist: which statistics keys may leave the device, and how each is coarsened.
 //
 // The file is a property list: a dictionary of groups, each with up to four tables from keys, or
-// beginnings of keys, to options. docs/whitelist.md describes it.
+// key prefixes, to options. docs/whitelist.md describes it.
 #pragma once
 
 #include <cstdint>
@@ -22,7 +22,7 @@ inline constexpr std::string_view kWhitelistPath =
 /// The group that only internal devices load.
 inline constexpr std::string_view kInternalTestingGroup = "InternalTesting";
 
-/// Names of the tables of a group. Other entries of a group are ignored.
+/// Names of a group's tables. Other entries of a group are ignored.
 inline constexpr std::string_view kScalarKeysTable = "ScalarKeys";
 inline constexpr std::string_view kScalarPrefixesTable = "ScalarKeyPrefixes";
 inline constexpr std::string_view kDistributionKeysTable = "DistributionKeys";
@@ -41,8 +41,8 @@ class BHConfig {
   /// skipped.
   static std::unique_ptr<BHConfig> init(Platform& platform);
 
-  /// The options of a key, an empty handle when it may not be reported. An exact entry comes
-  /// first, then the longest prefix; internal devices report every other key unchanged.
+  /// The options of a key; an empty handle when it may not be reported. An exact entry takes
+  /// precedence over the longest prefix. Internal devices report every other key unchanged.
   plist::Dictionary configOptionsForScalarKey(std::string_view key) const;
   plist::Dictionary configOptionsForDistributionKey(std::string_view key) const;
 

@@ -24,8 +24,8 @@ PrefixTree::PrefixTree(std::vector<std::string> prefixes) : prefixes_(std::move(
   build();
 }
 
-// Ranges still to be built wait on a list of their own: the file decides how deep prefixes nest,
-// and that must not decide the depth of the machine's stack.
+// Ranges still to be built wait in a list, not on the call stack, whose depth must not depend on
+// how deeply the prefixes in the file nest.
 void PrefixTree::build() {
   struct Range {
     std::size_t node, begin, end;
@@ -36,7 +36,7 @@ void PrefixTree::build() {
     Range range = pending.back();
     pending.pop_back();
 
-    // In sorted order the first and the last share what all share.
+    // In sorted order, the common beginning of the first and the last is common to all.
     const std::size_t depth = commonLength(prefixes_[range.begin], prefixes_[range.end - 1]);
     if (prefixes_[range.begin].size() == depth) {
       shorter_[range.begin] = range.longest;
@@ -59,7 +59,7 @@ void PrefixTree::build() {
   }
 }
 
-// The root is not a child, so its number means no child.
+// Returns 0, the root's number, for no child: the root is never a child.
 std::size_t PrefixTree::childFor(const Node& node, char next) const {
   if (node.childCount == 0) return 0;
   const char* branches = branches_.data() + node.firstChild;
@@ -70,7 +70,7 @@ std::size_t PrefixTree::childFor(const Node& node, char next) const {
 
 std::optional<std::string_view> PrefixTree::longestMatch(std::string_view key) const {
   if (nodes_.empty()) return std::nullopt;
-  // The branches alone lead to the node that shares the longest beginning with the key.
+  // Following the branches alone leads to the node that shares the longest beginning with the key.
   const Node* node = nodes_.data();
   while (node->length < key.size()) {
     const std::size_t child = childFor(*node, key[node->length]);
@@ -79,7 +79,7 @@ std::optional<std::string_view> PrefixTree::longestMatch(std::string_view key) c
   }
   std::uint32_t longest = node->longest;
   if (longest == kNone) return std::nullopt;
-  // Mostly the key begins with it whole.
+  // Usually the key begins with the whole prefix.
   if (key.starts_with(prefixes_[longest])) return prefixes_[longest];
   const std::size_t common = commonLength(key, prefixes_[longest]);
   while (longest != kNone && prefixes_[longest].size() > common)

@@ -26,12 +26,12 @@ class PrefixTree {
  private:
   static constexpr std::uint32_t kNone = 0xFFFF'FFFF;
 
-  // A node stands for the text from the root to it, which is the beginning of all prefixes below
-  // it. The children of a node are adjacent. Nodes are small, because a walk goes from one to the
-  // next and looks at texts only at its end.
+  // A node stands for the text on the path from the root, with which all prefixes below it begin.
+  // The children of a node are adjacent. Nodes are small: a walk steps from one to the next and
+  // compares text only at its end.
   struct Node {
     std::uint32_t length;   // of the text
-    std::uint32_t longest;  // the longest prefix with which it begins
+    std::uint32_t longest;  // the longest prefix of that text
     std::uint32_t firstChild;
     std::uint32_t childCount;
   };
@@ -40,7 +40,7 @@ class PrefixTree {
   std::size_t childFor(const Node& node, char next) const;
 
   std::vector<std::string> prefixes_;   // sorted, each once
-  std::vector<std::uint32_t> shorter_;  // for each, the longest other one that begins it
+  std::vector<std::uint32_t> shorter_;  // for each, its longest proper prefix among them
   std::vector<Node> nodes_;             // the root first
   std::vector<char> branches_;          // for each node, the byte that leads to it
 };
