@@ -1,5 +1,5 @@
-// The report of one day: the whitelisted statistics of that day, coarsened, with what the daemon
-// measures itself, in one property list for the submission service.
+// The report of one day: the whitelisted statistics of that day, coarsened, and the daemon's own
+// measurements, in one property list for the submission service.
 //
 //   BHReport(platform).writeLogForYesterday(day, appInfo);
 //
@@ -33,17 +33,17 @@ class BHReport {
   /// applications, an empty handle when the caller has none.
   LogOutcome writeLogForYesterday(std::int32_t day, const plist::Array& withAppInfo);
 
-  /// Adds the probes to what was collected, builds the log and submits it. A report in which
-  /// nothing was collected does nothing.
+  /// Adds the probes to the collected statistics, builds the log and submits it. Does nothing when
+  /// nothing was collected.
   LogOutcome serializeWithDate(std::int32_t day, const plist::Array& andAppInfo);
 
   // Scalars.
 
-  /// Coarsens `value` as the options ask, stores it and yields what was stored.
+  /// Coarsens `value` as the options say, stores it and returns the stored value.
   std::int64_t addScalar(std::int64_t value, std::string_view forKey,
                          const plist::Dictionary& withOptions);
 
-  /// Adds a scalar that is costly to measure: the block runs only when the key is whitelisted.
+  /// Adds a scalar that is costly to measure: calls the function only when the key is whitelisted.
   void addScalarForKey(std::string_view key, const std::function<std::int64_t()>& byExecutingBlock);
 
   // Distributions.

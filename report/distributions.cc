@@ -7,8 +7,8 @@ namespace {
 /// Welford's running summary: one pass, constant memory.
 class Summary {
  public:
-  /// Adds packed values and calls `also` with each. A function of its own, so that the numbers stay
-  /// in registers: each value waits for the mean of the one before.
+  /// Adds packed values and calls `also` with each. Not inlined, so that the numbers stay in
+  /// registers: each value depends on the mean of the previous one.
   template <class Also>
   [[gnu::noinline]] void addAll(std::string_view values, Also also) {
     Summary next = *this;
@@ -46,7 +46,7 @@ class Summary {
   double maximum_ = 0;
   double mean_ = 0;
   double squaredDeviations_ = 0;
-  std::uint32_t count_ = 0;  // read as a signed number of 32 bits
+  std::uint32_t count_ = 0;  // reported as a signed 32-bit number
 };
 
 }  // namespace
@@ -75,7 +75,7 @@ void BHReport::computeAndAddDistribution(BHHistoryDistributionEnumerator& values
     }
   }
 
-  // A summary of some values would look like one of all of them.
+  // A summary of some values would look like a summary of all.
   if (values.failed()) return;
 
   if (histogram) {

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-/// Looks up those of the two functions that `ProcessState` does not hold yet. False when one is
+/// Loads those of the two functions that `ProcessState` does not have yet. False when one is
 /// missing; the system log then says which.
 bool findFaultlinePreferences(Platform& platform);
 

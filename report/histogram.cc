@@ -14,13 +14,13 @@ namespace {
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
 constexpr double kNotANumber = std::numeric_limits<double>::quiet_NaN();
 
-// A boundary that is not a number stops no value.
+// A boundary of another type becomes not-a-number, which no value stops at.
 double boundaryOf(const plist::Value& value) {
   const auto number = value.number();
   return number ? number->real() : kNotANumber;
 }
 
-// Whether labels show both in the same way; false when it is not known.
+// Whether labels certainly show both boundaries in the same way.
 bool printAlike(const plist::Value& a, const plist::Value& b) {
   const auto left = a.number();
   const auto right = b.number();

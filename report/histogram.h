@@ -1,6 +1,6 @@
 // Histograms over explicit bucket boundaries.
 //
-// Bucket i counts the values x with b(i-1) < x <= b(i); the last one counts those above all
+// Bucket i counts the values x with b(i-1) < x <= b(i); the last bucket counts values above all
 // boundaries, and not-a-number. Boundaries may be in any order: the first one in the list that is
 // not less than a value decides.
 #pragma once
@@ -18,7 +18,7 @@ namespace tavrel {
 /// The index of the bucket of `value`, by a walk over boundaries in the order of the whitelist.
 std::uint32_t determineHistBucketForValue(double value, const plist::Array& withIntervals);
 
-/// The labels of buckets. Successive rows mostly have the same boundaries, so the labels of the
+/// The labels of buckets. Successive rows usually have the same boundaries, so the labels of the
 /// last chosen boundaries are kept, and only those.
 class HistogramLabels {
  public:
@@ -31,7 +31,7 @@ class HistogramLabels {
   std::vector<plist::String> labels_;
 };
 
-/// Labels and counts of the buckets that counted something; an empty handle when none did.
+/// Labels and counts of the buckets with a count; an empty handle when all are empty.
 plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
                                             std::span<const std::uint32_t> withHistCounts,
                                             HistogramLabels& labels);
@@ -42,16 +42,16 @@ plist::Dictionary histogramDictForIntervals(const plist::Array& intervals,
 /// comparison or two.
 class Histogram {
  public:
-  /// Nothing when there are more boundaries than the limit, or memory is short.
+  /// Nothing when there are more boundaries than the limit, or not enough memory.
   static std::optional<Histogram> create(const plist::Array& intervals);
 
   void count(double value) { ++counts_[bucketOf(value)]; }
   std::span<const std::uint32_t> counts() const { return counts_; }
 
-  /// The same index as `determineHistBucketForValue` gives.
+  /// The same index as from `determineHistBucketForValue`.
   std::uint32_t bucketOf(double value) const {
-    // Halving without branches: values come in no order that a CPU could predict. The comparison
-    // is written so that not-a-number passes every boundary.
+    // A binary search without branches, since a CPU cannot predict the order of values. The
+    // comparison is written so that not-a-number passes every boundary.
     const double* const ends = ends_.data();
     std::size_t passed = 0;
     for (std::size_t step = indexes_.size() / 2; step != 0; step /= 2)
@@ -62,11 +62,11 @@ class Histogram {
  private:
   Histogram() = default;
 
-  // The boundaries that can decide: those above all boundaries before them. They ascend, so that
-  // a search by halving finds the one at which the walk stops. With each its index in the
+  // The boundaries that can decide: those above all boundaries before them. They ascend, so a
+  // binary search finds the one at which the walk stops. `indexes_` has the index of each in the
   // whitelist's order, and last the index of the bucket above them all. The last index and an
-  // infinite boundary, which only not-a-number passes, are repeated until the indexes are a power
-  // of two.
+  // infinite boundary, which only not-a-number passes, are repeated until the number of indexes is
+  // a power of two.
   std::vector<double> ends_;
   std::vector<std::uint32_t> indexes_;
   std::vector<std::uint32_t> counts_;

@@ -14,7 +14,7 @@ struct OutcomeTexts {
   std::string_view reason;
 };
 
-// One row per outcome, in their order. The reasons hold for past and future runs.
+// One row per outcome, in enumeration order. The reasons are worded for past and future runs.
 constexpr OutcomeTexts kTexts[] = {
     {"filed", ""},
     {"not-permitted", "diagnostic submission not allowed"},

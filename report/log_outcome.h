@@ -1,4 +1,4 @@
-// What became of the log of a day, in the words that daemon and tool share.
+// The outcome of a day's log, and its texts, which daemon and tool share.
 #pragma once
 
 #include <cstdint>
@@ -27,7 +27,7 @@ std::string_view nameOf(LogOutcome outcome);
 
 /// The outcome of the last gated run, kept in the daemon's own domain; nothing when unknown.
 std::optional<LogOutcome> lastLogOutcome(Preferences& preferences);
-/// Sets the preference if it changes. The caller synchronises the domain.
+/// Sets the preference if it changes. The caller must synchronise the domain.
 void rememberLogOutcome(Preferences& preferences, LogOutcome outcome);
 
 }  // namespace tavrel

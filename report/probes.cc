@@ -23,8 +23,8 @@ constexpr std::string_view kUptimeKey = "com.norvane.usage.cur_boot_session_cpu_
 
 constexpr std::int64_t kBytesPerMiB = 1048576;
 
-/// A scalar that is read from a system control: its name, how long its value is in bytes (the
-/// reported number is in the first eight), and the value reported when it cannot be read.
+/// A scalar that is read from a system control: its name, the length of its value in bytes (the
+/// first eight hold the reported number), and the value reported when it cannot be read.
 struct VMControl {
   std::string_view key;
   std::string_view control;
@@ -50,7 +50,7 @@ std::int64_t readControl(SystemControls& controls, const VMControl& control) {
   std::array<std::byte, 32> buffer{};
   const MutableByteSpan value = MutableByteSpan(buffer).first(control.length);
   if (controls.read(control.control, value).errorNumber != 0) return control.failure;
-  // The zeros after a value of four bytes extend it.
+  // The zeros after a four-byte value extend it.
   return static_cast<std::int64_t>(*loadLittle64(buffer, 0));
 }
 

@@ -14,7 +14,7 @@ std::int64_t roundToBucket(std::int64_t value, std::uint32_t width);
 /// Rounds to at most `figures` significant figures, halves away from zero.
 std::int64_t roundToSignificantFigures(std::int64_t value, std::uint32_t figures);
 
-/// Rounds as the options of the key ask. An option that is not a number is skipped.
+/// Rounds as the key's options say. An option that is not a number is skipped.
 std::int64_t coarsened(std::int64_t value, const plist::Dictionary& options);
 
 }  // namespace tavrel
