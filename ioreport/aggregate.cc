@@ -7,7 +7,7 @@
 namespace tavrel {
 namespace {
 
-// The level with that name in a container of levels. Nothing comes of an empty level.
+// The level with that name in a container of levels, made if absent; empty for an empty `level`.
 plist::Dictionary sublevel(const plist::Dictionary& level, std::string_view container,
                            std::optional<std::string_view> name) {
   if (!level || !name) return {};

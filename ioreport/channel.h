@@ -1,5 +1,4 @@
-// The channel: a dictionary that says who publishes a quantity, under which id and type, and what
-// it is called.
+// The channel: a dictionary with the publisher, the ID, the type and the name of a quantity.
 //
 // A channel's legend is an array of its id, its type and, if it has one, its name. It belongs to
 // its publisher and is shared between the channel, its copies and its samples, so `setChannelType`
@@ -41,11 +40,11 @@ constexpr std::uint16_t elementCountOf(std::uint64_t channelType) {
   return static_cast<std::uint16_t>(channelType >> 32);
 }
 
-/// A number as a signed 64-bit integer; an unsigned one keeps its bits. Nothing for a real number
-/// that is not whole or exceeds 64 bits.
+/// A number as a signed 64-bit integer; an unsigned one keeps its bits. `kInvalidValue` for a real
+/// number that is not whole or exceeds 64 bits.
 std::int64_t integerOf(const std::optional<plist::Number>& number);
 
-/// A new legend; an empty handle when memory is short.
+/// A new legend; an empty handle when memory runs out.
 plist::Array createLegendChannel(std::uint64_t channelID, std::uint64_t channelType,
                                  std::optional<std::string_view> channelName, ErrorOut error);
 
@@ -62,7 +61,7 @@ plist::Dictionary createSiblingChannel(const plist::Dictionary& sibling,
                                        const plist::Array& legendChannel, ErrorOut error);
 
 KernelReturn getChannelType(const plist::Dictionary& channel, std::uint64_t& channelType);
-/// A legend without a type gets one.
+/// Adds a type to a legend that has none.
 KernelReturn setChannelType(const plist::Dictionary& channel, std::uint64_t channelType);
 
 std::uint8_t IOReportChannelGetFormat(const plist::Dictionary& channel);
@@ -77,8 +76,8 @@ std::optional<std::string_view> IOReportChannelGetSubGroup(const plist::Dictiona
 /// The name in the legend, otherwise the id when it spells one.
 std::optional<std::string_view> IOReportChannelGetChannelName(const plist::Dictionary& channel);
 
-/// The printable characters of which an id consists, from its highest byte down and without zero
-/// bytes; nothing when a byte is not printable or all are zero.
+/// The characters that an ID spells, from its highest byte down and without zero bytes; nothing
+/// when a byte is not printable or all are zero.
 std::optional<std::string> _copyPrintableIDString(std::uint64_t id);
 
 /// Stores a getter's result and returns the stored text.

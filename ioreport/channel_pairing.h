@@ -1,10 +1,9 @@
 // Pairs the channels of one array with those of another.
 //
-// A channel is first compared with that at its own index. If they differ, a search goes forward
-// through the others: from after the last one that a search found, or, if none has been found, from
-// after the channel's own index. Earlier positions are never searched again, so that channels pair
-// in order. The first search sorts the others by what identifies them, so that many searches stay
-// cheap.
+// A channel is first compared with the one at its own index. If they differ, a search goes forward
+// through the others: from the position after the last match of a search or, before any match,
+// after the channel's own index. Earlier positions are never searched again, so channels pair in
+// order. The first search sorts the others by identity, so that many searches stay cheap.
 #pragma once
 
 #include <compare>

@@ -37,7 +37,7 @@ bool subtractState(const Triple& states, std::size_t i) {
   return true;
 }
 
-// The sum of a bucket without new values means nothing, and it is unset before the first value.
+// The sum of a bucket without new values is meaningless, and before the first value it is unset.
 bool subtractBucket(const Triple& buckets, std::size_t i) {
   if (buckets.isInvalid(i, kBucketHits)) return false;
   const std::int64_t hits = buckets.difference(i, kBucketHits);
@@ -88,7 +88,7 @@ KernelReturn subtractElements(const Triple& elements,
   return kKernelSuccess;
 }
 
-// Answers without a text, which the caller of the formats below does not have either.
+// Reports no error text: for these formats, the caller has none either.
 KernelReturn subtract(std::uint8_t format, const plist::Dictionary& previous,
                       const plist::Dictionary& current, const plist::Dictionary& result) {
   if (format == kFormatSimple) {
@@ -124,7 +124,8 @@ KernelReturn computeDelta(const plist::Dictionary& previous, const plist::Dictio
 plist::Dictionary IOReportSampleCreateDelta(const plist::Dictionary& previous,
                                             const plist::Dictionary& current, ErrorOut error) {
   plist::Dictionary result = madeOrNull([&] { return plist::mutableCopy(previous); });
-  // The elements of the previous sample must not be written; without any, the computation fails.
+  // The result needs elements of its own: those of the previous sample must not be written. Without
+  // elements, the computation fails.
   if (cloneElements(result, previous, 0) != kKernelSuccess) result.remove(kRawElementsKey);
   return computeDelta(previous, current, result, error) == kKernelSuccess ? result
                                                                           : plist::Dictionary();

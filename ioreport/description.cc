@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// For an id in place of a channel's name.
+// The longest text of an ID that stands for a channel's name.
 constexpr std::size_t kChannelIDCharacters = 9;
 
 std::string_view upToZeroByte(std::string_view text) {
@@ -32,7 +32,7 @@ std::string nameOr(std::optional<std::string_view> name, std::uint64_t id, std::
   return format("%#llx", id).substr(0, longestID);
 }
 
-/// Describes the elements of one sample. What they have in common is looked up once.
+/// Describes the elements of one sample. Looks up their common properties once.
 class SampleDescription {
  public:
   SampleDescription(const plist::Dictionary& channel, std::uint8_t channelFormat,
@@ -115,7 +115,7 @@ class SampleDescription {
   const plist::Dictionary& channel_;
   std::uint8_t format_;
   Elements elements_;
-  Elements checked_;  // the same, but none when an accessor would not read them
+  Elements checked_;  // the same, but empty when accessors would not read them
   const char* prefix_;
   std::string name_;
   plist::Value unitLabel_;

@@ -3,8 +3,8 @@
 //   const auto text = IOReportSampleCopyDescription(channel, 0, "  ");
 //   if (text) std::fputs(text->c_str(), stdout);
 //
-// Missing names and labels are shown as "(null)". A description is whole or absent; one that
-// exceeds the memory that a device may claim is absent.
+// Missing names and labels are shown as "(null)". A description is complete or absent; it is absent
+// when it would take more memory than a device may demand.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// One line that says what the channel is, beginning with the prefix. The options are ignored.
+/// One line that identifies the channel, beginning with the prefix. The options are ignored.
 std::optional<std::string> IOReportChannelCopyDescription(const plist::Dictionary& channel,
                                                           std::uint32_t options,
                                                           const char* linePrefix);
@@ -28,8 +28,8 @@ std::optional<std::string> IOReportSampleCopyDescription(const plist::Dictionary
                                                          std::uint32_t options,
                                                          const char* linePrefix);
 
-/// Writes a text, up to its first zero byte, with a single call. A short write is an underrun; the
-/// rest is not written.
+/// Writes a text, up to its first zero byte, with a single call. A short write counts as an
+/// underrun; the rest is not written.
 KernelReturn IOReportWriteStringUTF8(DescriptorWriter& writer, int descriptor,
                                      std::optional<std::string_view> string);
 

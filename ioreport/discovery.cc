@@ -29,7 +29,8 @@ plist::Dictionary publicDrivers(ErrorOut error) {
   return matching;
 }
 
-// An aggregate of what `file` files of each service that matches; an empty handle when it fails.
+// An aggregate of the channels that `file` files for each matching service; an empty handle on
+// failure.
 template <class File>
 plist::Dictionary collect(DriverRegistry& drivers, const plist::Dictionary& matching,
                           std::int32_t options, ErrorOut error, const File& file) {

@@ -3,7 +3,7 @@
 //   std::optional<ErrorObject> error;
 //   auto channels = IOReportCopyAllChannels(drivers, streams, kOptionGroupByDriver, &error);
 //
-// A driver that takes part has the property "IOReportLegendPublic", and the property
+// A participating driver has the property "IOReportLegendPublic", and the property
 // "IOReportLegend": an array of group entries, each a dictionary with the channels of one group. A
 // query for one driver gets its channels whatever the value of the first property is; a search of
 // all drivers finds those where it is true. Returned aggregates are the caller's own.
@@ -22,7 +22,7 @@
 
 namespace tavrel {
 
-/// The channels of one driver, none when it does not publish them.
+/// The channels of one driver; none when it does not publish any.
 plist::Dictionary IOReportCopyChannelsForDriver(DriverService* service, std::int32_t options,
                                                 ErrorOut error);
 
@@ -31,13 +31,13 @@ plist::Dictionary IOReportCopyChannelsForDrivers(DriverRegistry& drivers,
                                                  const plist::Dictionary& matching,
                                                  std::int32_t options, ErrorOut error);
 
-/// The channels of all drivers that publish some. Skips a driver that fails, and prints it when the
-/// options have `kOptionPrintErrors`.
+/// The channels of all drivers that publish some. Skips a driver that fails, and prints its error
+/// when the options have `kOptionPrintErrors`.
 plist::Dictionary IOReportCopyAllChannels(DriverRegistry& drivers, StandardStreams& streams,
                                           std::int32_t options, ErrorOut error);
 
-/// A channel of that id for each service that matches, whether or not the service publishes one.
-/// Its type is unknown until it is sampled.
+/// A channel with that ID for each matching service, whether or not the service publishes one. Its
+/// type is unknown until it is sampled.
 plist::Dictionary IOReportCopyChannelsWithID(DriverRegistry& drivers,
                                              const plist::Dictionary& matching,
                                              std::uint64_t channelID, ErrorOut error);
@@ -48,13 +48,13 @@ std::optional<std::string> IOReportCopyDriverName(DriverService& service);
 /// "NAME <pid 123>".
 std::string IOReportCopyCurrentProcessName(Process& process);
 
-/// Calls back for each service that matches until a callback returns something other than 0, which
-/// is the result. When the registry changes meanwhile, the walk is aborted, not repeated.
+/// Calls back for each matching service until a callback returns a value other than 0, which is
+/// then the result. If the registry changes meanwhile, the walk is aborted, not repeated.
 KernelReturn iterateMatchingServices(DriverRegistry& drivers, const plist::Dictionary& matching,
                                      const std::function<KernelReturn(DriverService&)>& callback);
 
-/// Files the channels of a legend. Stops at the first malformed group entry and keeps what was
-/// filed; within a group, skips the rest from the first channel that is not an array.
+/// Files the channels of a legend. Stops at the first malformed group entry and keeps the channels
+/// filed so far; within a group, skips the first channel that is not an array and all after it.
 KernelReturn _addLegendChannels(const plist::Dictionary& aggregate, DriverService& service,
                                 const plist::Array& legend, std::int32_t options, ErrorOut error);
 

@@ -1,7 +1,7 @@
 // The elements of a sample: the 64-byte records, little-endian, in which a channel's values arrive.
 //
 //   offset  size
-//        0     8  provider id: that of the driver
+//        0     8  provider ID: the driver's
 //        8     8  channel id
 //       16     8  channel type; it counts the elements of the channel
 //       24     8  timestamp, unsigned, in the kernel's time base
@@ -20,8 +20,8 @@
 
 namespace tavrel {
 
-/// The meaning of an element's four values: in a simple channel the first is the value, in an array
-/// all four are.
+/// The meaning of an element's four values. A simple channel has its value in the first; an array
+/// uses all four.
 inline constexpr std::size_t kSimpleValue = 0;
 
 inline constexpr std::size_t kBucketHits = 0;  // of a histogram's bucket
@@ -34,8 +34,8 @@ inline constexpr std::size_t kStateInTransitions = 1;
 inline constexpr std::size_t kStateResidency = 2;
 
 /// A view of the elements in a buffer, through which they can be written. It borrows the buffer.
-/// Only the low 16 bits of the count are kept. Of a missing element, ask only for values; they are
-/// invalid.
+/// Keeps only the low 16 bits of the count. Do not ask a missing element for anything but its
+/// values, which are invalid.
 class Elements {
  public:
   Elements() = default;
@@ -57,7 +57,7 @@ class Elements {
                   static_cast<std::uint64_t>(value));
   }
 
-  /// Copies the bytes of as many elements from `other`, which must have them.
+  /// Copies as many elements from `other`, which must have them.
   void copyFrom(const Elements& other) const;
 
  private:
@@ -73,10 +73,10 @@ class Elements {
 Elements getRawElements(const plist::Dictionary& channel, std::uint8_t expectedFormat);
 
 /// The same, provided that the channel's type also has that format and, for histograms and states,
-/// counts as many elements.
+/// the same number of elements.
 Elements elementsOfType(const plist::Dictionary& channel, std::uint8_t format);
 
-/// A value of one element of a channel of that type; invalid when there is none.
+/// One value of an element, for a channel of that format; invalid when there is none.
 std::int64_t elementValue(const plist::Dictionary& channel, std::uint8_t format, std::int32_t index,
                           std::size_t value);
 

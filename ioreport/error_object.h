@@ -6,7 +6,7 @@
 //   std::optional<ErrorObject> error;
 //   if (!IOReportCopyChannelsForDriver(service, 0, &error)) log(error->failureReason);
 //
-// Only a failure writes the place, by the outermost operation that has something to say.
+// Only failures write to that place; the outermost operation that has an error to report decides.
 #pragma once
 
 #include <cstdint>
@@ -34,7 +34,7 @@ struct ErrorObject {
 /// Where an operation puts its error; null when the caller does not want one.
 using ErrorOut = std::optional<ErrorObject>*;
 
-/// An error with a reason, which is UTF-8. Nothing when the text is malformed or memory is short; a
+/// An error with a reason, which is UTF-8. Nothing when the text is malformed or memory runs out; a
 /// fixed reason when there is no text.
 std::optional<ErrorObject> createCFErr(KernelReturn code, const char* text);
 
@@ -44,7 +44,7 @@ KernelReturn fail(ErrorOut error, KernelReturn code, const char* text);
 /// The sign bit of an aggregate's options: errors of single drivers are printed.
 inline constexpr std::int32_t kOptionPrintErrors = INT32_MIN;
 
-/// Prints a line on standard error when the options ask for it.
+/// Prints a line on standard error when the options have `kOptionPrintErrors`.
 void iorErrLog(StandardStreams& streams, std::int32_t options,
                std::optional<std::string_view> functionName,
                const std::optional<ErrorObject>& error);

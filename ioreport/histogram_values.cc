@@ -8,14 +8,14 @@
 namespace tavrel {
 namespace {
 
-// A segment of a bucket configuration: 16 bytes, little-endian; the word at offset 8 is not read.
+// A segment of a bucket configuration: 16 bytes, little-endian; the word at offset 8 is ignored.
 constexpr std::size_t kSegmentBytes = 16;
 constexpr std::size_t kSegmentBase = 0;
 constexpr std::size_t kSegmentIsExponential = 4;
 constexpr std::size_t kSegmentBucketCount = 12;
 
-// The upper bounds of all buckets; an empty handle when they do not ascend from above 0, or are
-// more than `largestCount`.
+// The upper bounds of all buckets; an empty handle when they do not ascend, beginning above 0, or
+// are more than `largestCount`.
 plist::Array bucketBounds(ByteSpan configuration, std::size_t largestCount) {
   const std::size_t segments = configuration.size() / kSegmentBytes;
   if (segments == 0) return {};
@@ -41,7 +41,7 @@ plist::Array bucketBounds(ByteSpan configuration, std::size_t largestCount) {
   return bounds;
 }
 
-// The bounds of a channel, which caches them once they are computed.
+// The bounds of a channel, computed once and cached in it.
 plist::Array processedBounds(plist::Dictionary channel) {
   const std::int32_t count = IOReportHistogramGetBucketCount(channel);
   if (!channel.contains(kProcessedConfigKey) && count >= 0) {

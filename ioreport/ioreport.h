@@ -1,5 +1,5 @@
-// The whole client of the kernel's reporting facility. Drivers publish channels: counters, arrays
-// of them, histograms and times spent in states. Read the headers in this order:
+// The complete client of the kernel's reporting facility. Drivers publish channels: counters,
+// arrays of them, histograms and times spent in states. Read the headers in this order:
 //
 //   error_object.h   how failures are reported
 //   channel.h        one channel, and who and what it is
@@ -14,7 +14,7 @@
 //   units.h          labels and scaling
 //   description.h    channels and samples as text
 //
-// A daily look at all simple channels, for instance, is
+// For instance, to read all simple channels once a day:
 //
 //   auto channels = IOReportCopyChannelsOfFormat(drivers, streams, kFormatSimple, 0, &error);
 //   plist::Dictionary subscribed;
@@ -26,8 +26,8 @@
 //     return kIterateContinue;
 //   });
 //
-// The library keeps nothing between calls. What it returns belongs to the caller, except for
-// operations with "Get" in their names: their results are borrowed from the argument.
+// The library keeps nothing between calls. Results belong to the caller, except those of operations
+// with "Get" in their names, which are borrowed from the argument.
 #pragma once
 
 #include "ioreport/aggregate.h"         // IWYU pragma: export

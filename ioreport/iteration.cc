@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// A walk ends at the first odd result, which then is its result.
+// The first odd result ends the walk and becomes its result.
 IterateResult combined(IterateResult earlier, IterateResult next) {
   return walkFailed(next) ? next : earlier | next;
 }
@@ -32,8 +32,8 @@ plist::Dictionary copyOfChannel(const plist::Dictionary& channel) {
   return copy;
 }
 
-/// An iterate walk that only counts. It does not read the channels, which in large aggregates are
-/// far apart in memory.
+/// An iterate walk that only counts, without reading the channels, which are far apart in the
+/// memory of a large aggregate.
 struct CountWalk {
   std::int32_t& count;
 };
@@ -42,15 +42,14 @@ IterateResult walkChannels(const CountWalk& walk, const plist::Array& channels, 
                            plist::Array&) {
   for (const plist::Value& channel : channels) {
     if (channel.kind() != plist::Kind::Dictionary) return kIterateFailed;
-    // Arrays that are shared may hold more channels than memory does.
+    // Shared arrays may count for more channels than fit into memory.
     if (walk.count == INT32_MAX) return kIterateFailed;
     ++walk.count;
   }
   return kIterateContinue;
 }
 
-// The walk visits the channels that the array has when it arrives, not those that callbacks add to
-// it.
+// The walk visits the channels that are in the array when it arrives, not those that callbacks add.
 IterateResult walkChannels(const IterateWalk& walk, const plist::Array& channels,
                            const plist::Array&, plist::Array&) {
   IterateResult result = kIterateContinue;
@@ -62,9 +61,9 @@ IterateResult walkChannels(const IterateWalk& walk, const plist::Array& channels
   return result;
 }
 
-/// Takes channels out of an array from front to back. What is kept moves up at once and the end is
-/// cut off last, so that the cost does not depend on how many are taken out. Nothing is lost when
-/// it ends early.
+/// Removes channels from an array, from front to back. Each kept channel moves up at once, and the
+/// end is cut off last, so that the cost does not depend on the number removed. Nothing is lost
+/// when it ends early.
 class Removal {
  public:
   explicit Removal(const plist::Array& channels) : channels_(channels) {}
@@ -193,7 +192,7 @@ class Engine {
     return result;
   }
 
-  // The entries are listed first, because a callback may file channels under new names.
+  // List the entries first, because a callback may file channels under new names.
   IterateResult walkContainer(std::string_view key, plist::Dictionary& level,
                               const plist::Dictionary& other, plist::Dictionary& built,
                               std::size_t depth) const {

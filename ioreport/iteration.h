@@ -8,12 +8,12 @@
 // All walks have the same order: a level's own channels, then the levels of its drivers, then those
 // of its groups. A walk returns the results of its callbacks, OR-ed together; an odd result ends it
 // and is its result, so a caller tests one bit (`walkFailed`). A walk ends with `kIterateFailed`
-// when memory is short, or the aggregate is malformed, nested too deeply or contains itself.
+// when memory runs out, or when the aggregate is malformed, nested too deeply or contains itself.
 //
 // A callback may change the channel that it gets, as getters do. It must not remove anything from
-// the aggregate, nor throw. The walk does not visit what a callback adds to the array and level at
-// hand. While an aggregate is pruned its arrays have gaps, and the callback must not even read it.
-// A walk without a callback fails.
+// the aggregate, nor throw. The walk does not visit channels that a callback adds to the current
+// array and level. While an aggregate is being pruned, its arrays have gaps, and the callback must
+// not even read it. A walk without a callback fails.
 #pragma once
 
 #include <cstdint>
@@ -31,7 +31,7 @@ using IterateResult = std::int32_t;
 inline constexpr IterateResult kIterateContinue = 0;
 /// Ends the walk, as all odd values do.
 inline constexpr IterateResult kIterateStop = 1;
-/// Removes the channel from the aggregate that is pruned, or leaves it out of the new one.
+/// Removes the channel from the pruned aggregate, or leaves it out of the new one.
 inline constexpr IterateResult kIterateRemove = 16;
 inline constexpr IterateResult kIterateFailed = 273;
 
@@ -52,7 +52,7 @@ IterateResult IOReportIterate(const plist::Dictionary& aggregate, const ChannelC
 /// empty. When the walk stops early, removed channels stay removed.
 IterateResult IOReportPrune(const plist::Dictionary& aggregate, const ChannelCallback& callback);
 
-/// Of the whole tree; -1 when it is malformed.
+/// The number of channels in the whole tree; -1 when it is malformed.
 std::int32_t IOReportGetChannelCount(const plist::Dictionary& aggregate);
 
 /// Files all channels of the source, by reference, as the destination's options say.

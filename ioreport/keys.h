@@ -16,7 +16,7 @@ inline constexpr std::string_view kGroupNameKey = "IOReportGroupName";
 inline constexpr std::string_view kSubGroupNameKey = "IOReportSubGroupName";
 inline constexpr std::string_view kChannelInfoKey = "IOReportChannelInfo";
 
-// What getters keep in a channel.
+// Cached by getters in a channel.
 inline constexpr std::string_view kChannelNameKey = "ChannelName";
 inline constexpr std::string_view kUnitLabelKey = "UnitLabel";
 inline constexpr std::string_view kStateNamesKey = "StateNames";

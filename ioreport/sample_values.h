@@ -4,10 +4,10 @@
 //   const std::int64_t reads = IOReportSimpleGetIntegerValue(channel, &unit);
 //   if (reads != kInvalidValue) ...
 //
-// Every accessor, also of histograms and states, checks that the channel has its format and that
-// the index is in range, and otherwise returns a fixed value: `kInvalidValue` for values and ids,
-// -1 for counts and indexes, not-a-number for a duty cycle, nothing for a name. None of them
-// copies.
+// Every accessor, including those of histograms and states, checks that the channel has its format
+// and that the index is in range. Otherwise it returns a fixed value: `kInvalidValue` for values
+// and IDs, -1 for counts and indexes, not-a-number for a duty cycle, nothing for a name. No
+// accessor copies elements.
 #pragma once
 
 #include <cstdint>

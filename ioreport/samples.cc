@@ -40,7 +40,7 @@ IterateResult SampleExtractor::extractChannelSample(const plist::Dictionary& cha
     status_ = kKernelNotFound;
     return kIterateRemove;
   }
-  // The type is read from the copy: the hub might write the buffer meanwhile.
+  // Read the type from the copy: the hub might be writing to the buffer.
   const plist::Data elements(*group);
   if (IOReportChannelGetFormat(channel) == kFormatUnknown) {
     setChannelType(newChannel, *loadLittle64(elements.bytes(), kElementType));

@@ -37,15 +37,15 @@ class SampleExtractor {
 
   /// Gives the copy of a channel its elements and, when the channel's own type is unknown, the type
   /// in them. Returns `kIterateRemove` for a channel that is not in the buffer, and `kIterateStop`
-  /// when the channel could only follow a group of no elements, at which a buffer ends.
+  /// when the channel could only come after a group without elements, which ends a buffer.
   IterateResult extractChannelSample(const plist::Dictionary& channel,
                                      plist::Dictionary& newChannel);
 
-  /// The error with which sampling fails, if it fails.
+  /// The error code to report if sampling fails.
   KernelReturn status() const { return status_; }
 
  private:
-  // In the order in which they are searched: by channel, and each channel's in the buffer's order.
+  // Sorted for searching: by channel, and for each channel in the buffer's order.
   struct Group {
     std::uint64_t providerID;
     std::uint64_t channelID;

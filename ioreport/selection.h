@@ -2,8 +2,8 @@
 //
 //   auto disks = IOReportCopyChannelsInGroup(drivers, streams, "Disks", std::nullopt, 0, &error);
 //
-// The copying operations discover the channels of all drivers and then prune the others. Returned
-// aggregates are the caller's own.
+// The copying operations discover the channels of all drivers and then prune those not selected.
+// Returned aggregates are the caller's own.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@
 
 namespace tavrel {
 
-/// The channels that have one of the categories, and those whose type cannot be read.
+/// The channels with at least one of the categories, and those whose type cannot be read.
 plist::Dictionary IOReportCopyChannelsInCategories(DriverRegistry& drivers,
                                                    StandardStreams& streams,
                                                    std::uint16_t categories, std::int32_t options,
@@ -28,7 +28,7 @@ plist::Dictionary IOReportCopyChannelsOfFormat(DriverRegistry& drivers, Standard
                                                std::uint8_t format, std::int32_t options,
                                                ErrorOut error);
 
-/// The channels of exactly that unit, scale included.
+/// The channels with exactly that unit, including its scale.
 plist::Dictionary IOReportCopyChannelsWithUnit(DriverRegistry& drivers, StandardStreams& streams,
                                                std::uint64_t unit, std::int32_t options,
                                                ErrorOut error);

@@ -11,7 +11,7 @@ namespace {
 
 constexpr double kNotANumber = std::numeric_limits<double>::quiet_NaN();
 
-// An empty handle when one of the states has no name.
+// The names that the states' IDs spell; an empty handle when one of the states has none.
 plist::Array spelledNames(const Elements& states) {
   if (!states) return {};
   plist::Array names = plist::Array::create(states.count());

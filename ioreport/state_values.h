@@ -1,5 +1,5 @@
-// The values of state channels, one element per state. sample_values.h says what accessors return
-// for a channel of another format and an index out of range.
+// The values of state channels, one element per state. See sample_values.h for the results for a
+// channel of another format or an index out of range.
 #pragma once
 
 #include <cstddef>
@@ -12,36 +12,36 @@
 
 namespace tavrel {
 
-/// From the channel's type, whether it is sampled or not.
+/// The number of states in the channel's type, whether or not it is sampled.
 std::int32_t IOReportStateGetCount(const plist::Dictionary& channel);
 
 std::int64_t IOReportStateGetIDForIndex(const plist::Dictionary& channel, std::int32_t index);
 /// The last state that has the id.
 std::int32_t IOReportStateGetIndexForID(const plist::Dictionary& channel, std::int64_t stateID);
 
-/// What the state's id spells, borrowed from the channel, which keeps the names of all its states.
-/// Nothing when one of them has no name.
+/// The name that the state's ID spells, borrowed from the channel, which caches the names of all
+/// its states. Nothing when one of them has no name.
 std::optional<std::string_view> IOReportStateGetNameForIndex(const plist::Dictionary& channel,
                                                              std::int32_t index);
 
 /// How often the state was entered.
 std::int64_t IOReportStateGetInTransitions(const plist::Dictionary& channel, std::int32_t index);
-/// How long it lasted altogether, unsigned, in the channel's unit.
+/// The total time spent in the state, unsigned, in the channel's unit.
 std::int64_t IOReportStateGetResidency(const plist::Dictionary& channel, std::int32_t index);
 /// Its residency as a fraction of the residency of all states.
 double IOReportStateGetDutyCycle(const plist::Dictionary& channel, std::int32_t index);
-/// The first of the states whose element has the latest timestamp; -1 when none has a timestamp.
+/// The first state whose element has the latest timestamp; -1 when none has a timestamp.
 std::int32_t IOReportStateGetCurrent(const plist::Dictionary& channel);
 
 // -- All states of a channel at once, for callers that need many of them -------------------------
 
-/// The names of all states, which are kept in the channel; an empty handle when one has none.
+/// The names of all states, cached in the channel; an empty handle when one has none.
 plist::Array stateNames(const plist::Dictionary& channel);
 
-/// In two's complement.
+/// The sum of all residencies, in two's complement.
 std::uint64_t totalResidency(const Elements& states);
 
-/// Not-a-number when the total is 0.
+/// The state's share of `total`; not-a-number when the total is 0.
 double dutyCycle(const Elements& states, std::size_t index, std::uint64_t total);
 
 }  // namespace tavrel

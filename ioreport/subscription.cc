@@ -7,7 +7,7 @@
 namespace tavrel {
 namespace {
 
-// Keeps the list below 2^31 bytes.
+// The most channels of interest, so that their list stays below 2^31 bytes.
 constexpr std::int32_t kMostInterests = 0x555554D;
 
 KernelReturn callHub(UserClient& connection, std::uint32_t method,

@@ -6,8 +6,8 @@
 //                                                  &error);
 //   auto samples = IOReportCreateSamples(subscription.get(), subscribed, &error);
 //
-// The hub writes the shared memory only on request; each call of `IOReportCreateSamples` makes one.
-// One thread at a time may use a subscription.
+// The hub writes to the shared memory only on request; each call of `IOReportCreateSamples` is one.
+// Only one thread at a time may use a subscription.
 #pragma once
 
 #include <cstdint>
@@ -24,7 +24,7 @@
 
 namespace tavrel {
 
-/// The connection to the hub, and the buffer that it shares. Both are released at the end.
+/// The connection to the hub, and the buffer that it shares. The destructor releases both.
 class IOReportSubscription {
  public:
   IOReportSubscription() = default;
@@ -32,7 +32,7 @@ class IOReportSubscription {
   IOReportSubscription& operator=(const IOReportSubscription&) = delete;
   ~IOReportSubscription() { subscriptionFinalize(); }
 
-  /// The elements as of the last update. Borrowed from the subscription.
+  /// The elements at the last update. Borrowed from the subscription.
   ByteSpan buffer() const { return buffer_ ? buffer_->bytes() : ByteSpan(); }
 
  private:
@@ -58,16 +58,17 @@ std::shared_ptr<IOReportSubscription> IOReportCreateSubscription(
     const plist::Dictionary& desiredChannels, plist::Dictionary* subscribedChannels,
     std::uint32_t reserved, ErrorOut error);
 
-/// Makes the hub write the current elements of all channels into the shared buffer.
+/// Makes the hub write the current elements of all channels to the shared buffer.
 KernelReturn updateKernelBuffer(const IOReportSubscription& subscription, ErrorOut error);
 
-/// The list of channels of interest that is sent to the hub; complete with `count` entries. It
-/// takes memory as it fills.
+/// The list of channels of interest for the hub, complete with `count` entries. It allocates memory
+/// as it fills.
 class InterestList {
  public:
   explicit InterestList(std::size_t count);
 
-  /// Writes the next entry. Stops at a channel that cannot be subscribed to, and when it is full.
+  /// Writes the next entry. Stops at a channel that cannot be subscribed to, and when the list is
+  /// full.
   IterateResult addInterest(const plist::Dictionary& channel);
   bool isComplete() const { return bytes_.size() == completeBytes_; }
   ByteSpan bytes() const { return bytes_; }
@@ -77,7 +78,8 @@ class InterestList {
   std::size_t completeBytes_;
 };
 
-/// Nothing when one of the channels lacks an id or a type, or there are more than the hub takes.
+/// Nothing when one of the channels lacks an id or a type, or there are more channels than the hub
+/// accepts.
 std::optional<InterestList> createInterestList(const plist::Dictionary& channels,
                                                std::int32_t count);
 

@@ -53,7 +53,7 @@ inline constexpr QuantitySuffix kQuantitySuffixes[] = {
     {100, "events"}, {101, "packets"},
 };
 
-/// Of data: bits and bytes without a prefix.
+/// Suffixes of data: bits and bytes without a prefix.
 inline constexpr ScaleLabel kDataSuffixes[] = {
     {0x000000, 0, "b"},
     {0x008200, 0, "B"},

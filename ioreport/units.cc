@@ -41,7 +41,8 @@ std::string_view suffixOf(std::uint64_t unit) {
   return row == std::end(kQuantitySuffixes) ? kUnknownQuantity : row->text;
 }
 
-// The exponent of a byte of the scale, 0 when it has none. The bias leaves 8 bits, signed.
+// The exponent in a byte of the scale, 0 when it has none. Without the bias, it is a signed 8-bit
+// number.
 constexpr std::int8_t exponentOf(std::uint32_t scaleByte) {
   return scaleByte == 0 ? std::int8_t{0} : static_cast<std::int8_t>(scaleByte - 127);
 }
