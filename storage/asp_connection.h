@@ -21,20 +21,20 @@ struct ASPConnection {
   const NandExporter* exporter = nullptr;
 };
 
-/// True when the driver exists, could be opened and has statistics of the known format; otherwise
-/// the record is closed again.
+/// True when the driver exists, can be opened and has statistics in the known format; otherwise the
+/// connection is closed again.
 bool openASPConnection(DriverRegistry& drivers, StandardStreams& streams,
                        ASPConnection& connection);
 
-/// Does nothing to a closed record.
+/// Does nothing when already closed.
 void closeASPConnection(ASPConnection& connection);
 
-/// A connection to the first driver that is present, null when there is none. `exporter` receives
-/// its row.
+/// Connects to the first driver that is present; null when there is none. `exporter` receives its
+/// row.
 std::unique_ptr<UserClient> ANDConnect(DriverRegistry& drivers, StandardStreams& streams,
                                        const NandExporter*& exporter);
 
-/// Closes. Closing an empty handle fails.
+/// Closes the connection. Closing an empty handle fails.
 void ANDDisconnect(StandardStreams& streams, std::unique_ptr<UserClient> connection);
 
 /// Whether the controller recommends deleting content.

@@ -1,7 +1,7 @@
-// Where the counters of a NAND chip are in its 4 KiB block, by generation and maker.
+// The places of a NAND chip's counters in its 4 KiB block, by generation and maker.
 //
-// The block is read as little-endian words of 32 bits. A row says that elements `first` to `last`
-// of an array take words `firstWord` to `lastWord`, in order. Elements that no row names are 0.
+// The block is read as little-endian words of 32 bits. A row assigns words `firstWord` to
+// `lastWord`, in order, to elements `first` to `last` of an array. Elements without a row are 0.
 #pragma once
 
 #include <array>
@@ -22,7 +22,7 @@ namespace counter_maps {
 using enum CounterArray;
 
 // clang-format off
-/// Controllers of the first generation, whatever the chip.
+/// Controllers of the first generation, with any chip.
 inline constexpr auto kAlgoGenericMap = std::to_array<CounterRange>({
     {readStage, 0, 18, 0, 18},
     {readStage, 19, 19, 37, 37},
@@ -48,7 +48,7 @@ inline constexpr auto kAlgoGenericMap = std::to_array<CounterRange>({
     {algoNANDAccessesBin, 0, 7, 106, 113},
 });
 
-/// Controllers of the second generation, whatever the chip.
+/// Controllers of the second generation, with any chip.
 inline constexpr auto kAlgoGenericK4Map = std::to_array<CounterRange>({
     {readStage, 0, 7, 0, 7},
     {readStage, 9, 18, 9, 18},
@@ -89,7 +89,7 @@ inline constexpr auto kAlgoGenericK4Map = std::to_array<CounterRange>({
     {retentionIndication, 2, 3, 75, 76},
 });
 
-/// Older controllers with chips that have no map of their own.
+/// Older controllers with chips that have no map below.
 inline constexpr auto k1yMap = std::to_array<CounterRange>({
     {readStage, 0, 7, 256, 263},
     {readStage, 8, 8, 265, 265},

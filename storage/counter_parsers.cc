@@ -15,7 +15,7 @@ namespace {
 
 constexpr std::size_t kWordBytes = 4;
 
-// Whether every range lies in its array and in the block, as long as its words, and none of them
+// Whether every range lies in its array and in the block, has as many elements as words, and none
 // overlap.
 template <std::size_t N>
 consteval bool isSound(const std::array<CounterRange, N>& map) {
@@ -45,7 +45,7 @@ void copyRange(CounterBlock block, TelemetryCounters& record) {
   }
 }
 
-// The ranges are constants of the copying code, which needs no table at run time.
+// The ranges become constants in the copying code, which needs no table at run time.
 template <const auto& kMap>
 void copyCounters(CounterBlock block, TelemetryCounters& record) {
   static_assert(isSound(kMap));

@@ -1,4 +1,4 @@
-// Brings the counter block of a NAND chip into the common form.
+// Converts the counter block of a NAND chip to the common form.
 //
 //   const auto id = readManufacturerId(streams, "4582603A5700");
 //   const auto parse = selectCounterParser(chipGeneration("K2V"), id.vendor, id.device);
@@ -27,7 +27,7 @@ void parseOnlyAlgoGenericCountersK4(CounterBlock block, TelemetryCounters& recor
 void parseCounters1y(CounterBlock block, TelemetryCounters& record);
 void parseCounters1xSandisk(CounterBlock block, TelemetryCounters& record);
 void parseCounters1xHynix(CounterBlock block, TelemetryCounters& record);
-/// The same as those with "Only".
+/// These do the same as those with "Only".
 void parseCountersAlgoGeneric(CounterBlock block, TelemetryCounters& record);
 void parseCountersAlgoGenericK4(CounterBlock block, TelemetryCounters& record);
 
@@ -35,7 +35,7 @@ void parseCountersAlgoGenericK4(CounterBlock block, TelemetryCounters& record);
 inline constexpr std::uint32_t kGenerationK3 = 1;
 inline constexpr std::uint32_t kGenerationK4 = 2;
 
-/// Of a controller's "chip-id".
+/// The generation in a controller's "chip-id".
 std::uint32_t chipGeneration(std::string_view chipId);
 
 struct ManufacturerId {
@@ -43,15 +43,15 @@ struct ManufacturerId {
   std::uint32_t device = 0;  // without its lowest byte
 };
 
-/// Of a controller's "manufacturer-id", up to 12 hexadecimal digits: 4 of the vendor, the rest of
-/// the device. Missing digits count as 0; other characters are reported on standard output.
+/// Reads a controller's "manufacturer-id", up to 12 hexadecimal digits: 4 for the vendor, the rest
+/// for the device. Missing digits count as 0; other characters are reported on standard output.
 ManufacturerId readManufacturerId(StandardStreams& streams, std::string_view text);
 
 /// The generation takes precedence over the maker.
 CounterParser selectCounterParser(std::uint32_t generation, std::uint32_t vendor,
                                   std::uint32_t device);
 
-/// The name of one of the parsers.
+/// The name of a parser.
 std::string_view counterParserName(CounterParser parser);
 
 }  // namespace tavrel

@@ -53,8 +53,8 @@ void reportNANDInfoScalars(Platform& platform) {
 
 // -- ECC events ---------------------------------------------------------------------------------
 
-// The kernel's record: the event's identifier and its count of registers (a byte each), 6 bytes
-// that are not read, and the registers, 64 bits each in little-endian order.
+// The kernel's record: the event's identifier and its count of registers (a byte each), 6 ignored
+// bytes, and the registers, 64 bits each, little-endian.
 constexpr std::uint64_t kEventID = 0;
 constexpr std::uint64_t kRegisterCount = 1;
 constexpr std::uint64_t kRegisters = 8;
@@ -63,7 +63,7 @@ using ECCEventRecord = std::array<std::byte, 72>;
 
 constexpr int kMostEventsLogged = 10;
 
-/// Errors that only mean that there is nothing to read now.
+/// Errors that mean only that there is nothing to read now.
 constexpr int kNoSuchEntry = 2;
 constexpr int kBusy = 16;
 
@@ -87,7 +87,7 @@ void reportECCEvents(Platform& platform) {
     platform.crashReporting->FLLogStructuredData(kEccRecordType, dictionaryOf(event));
     error = readNext();
   }
-  // Also logged, with 0, when events were left over: the last one read is not logged.
+  // Also logged, with errno 0, when the limit leaves events over: the last one read is not filed.
   if (error != kNoSuchEntry && error != kBusy) {
     platform.log->log(LogLevel::Default, "Unexpected errno (%d) reading ECC events from kernel",
                       error);

@@ -6,10 +6,10 @@
 
 namespace tavrel {
 
-/// Files the state of the flash storage as scalars of today: disk usage, the NAND information, and
+/// Records the state of the flash storage as today's scalars: disk usage, the NAND information, and
 /// every simple report channel of the storage category. Also writes the structured storage log and
-/// files pending ECC events as structured records. A step that fails does not stop the others.
-/// Calls `onStep` for each.
+/// files pending ECC events as structured records. A failed step does not stop the others. Calls
+/// `onStep` for each step.
 void dailyStorageStatistics(Platform& platform, const StepObserver& onStep = {});
 
 }  // namespace tavrel

@@ -6,14 +6,14 @@
 namespace tavrel {
 namespace {
 
-// Header: 4 bytes that are not read, the counts of bad blocks that the factory found and of the
-// defects that follow (32 bits each).
+// Header: 4 ignored bytes, the number of bad blocks found by the factory, and the number of the
+// following defects (32 bits each).
 constexpr std::uint64_t kFactoryCount = 4;
 constexpr std::uint64_t kDefectCount = 8;
 constexpr std::uint64_t kHeaderBytes = 12;
 
 constexpr std::uint64_t kDefectBytes = 28;
-constexpr std::uint64_t kTemperature = 24;  // signed, 8 bits; the last 3 bytes are not read
+constexpr std::uint64_t kTemperature = 24;  // signed, 8 bits; the last 3 bytes are ignored
 
 struct Field {
   const char* key;

@@ -1,4 +1,4 @@
-// Memory for what a driver returns, of a size that the driver chose.
+// Memory for data from a driver, in a size that the driver chose.
 //
 //   const DeviceBuffer buffer = DeviceBuffer::allocate(size);
 //   if (!buffer) complain();
@@ -16,8 +16,8 @@
 
 namespace tavrel {
 
-/// Page-aligned and zeroed, so that bytes that a driver does not fill read as 0. Empty when the
-/// allocation failed or would exceed the limit; a buffer of 0 bytes is not empty.
+/// Page-aligned and zeroed: bytes that the driver does not fill read as 0. The handle is empty when
+/// the allocation failed or would exceed the limit; with 0 bytes, it is not.
 class DeviceBuffer {
  public:
   DeviceBuffer() = default;
@@ -38,7 +38,7 @@ class DeviceBuffer {
   MutableByteSpan bytes() const { return {memory_.get(), size_}; }
 
  private:
-  /// In bytes; no device has larger pages.
+  /// In bytes. No device has larger pages.
   static constexpr std::align_val_t kAlignment{65536};
 
   struct Free {

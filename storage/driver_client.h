@@ -1,4 +1,4 @@
-// A connection to a storage driver for as long as one piece of work takes.
+// A connection to a storage driver for the duration of one piece of work.
 #pragma once
 
 #include "platform/driver_registry.h"

@@ -15,7 +15,7 @@ constexpr std::uint32_t kNoSelector = 0xFFFFFFFF;
 
 bool fetchOver(UserClient& client, const NandExporter& exporter, StandardStreams& streams,
                ASPContext& context) {
-  // A driver without a table gets no request.
+  // A driver without a table is called without a request.
   const SelectorTable* table = nullptr;
   if (exporter.statistics) {
     table = exporter.statistics();

@@ -9,11 +9,11 @@
 
 namespace tavrel {
 
-/// Of at most the first 2 characters.
+/// Reads at most 2 characters.
 std::uint8_t hexStringToByte(StandardStreams& streams, std::string_view text);
 
-/// Of at most the first 8 characters, byte by byte from the left: an odd last character is a byte
-/// of its own, so that "abc" is 0xAB0C.
+/// Reads at most 8 characters, byte by byte from the left: an odd last character is a byte of its
+/// own, so "abc" is 0xAB0C.
 std::uint32_t hexStringToInt32(StandardStreams& streams, std::string_view text);
 
 }  // namespace tavrel

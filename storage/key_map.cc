@@ -17,8 +17,8 @@ constexpr std::size_t firstSlot(std::string_view name) {
   return (hash ^ hash >> 16) % kSlots;
 }
 
-// Row numbers + 1 in an open-addressing table, 0 for a free slot. Of rows with one name only the
-// first is stored, which is the one that a walk from the front finds.
+// Row numbers + 1 in an open-addressing table, 0 for a free slot. Of rows with the same name, only
+// the first is stored, as a search from the front would find it.
 constexpr auto kRowsBySlot = [] {
   std::array<std::uint16_t, kSlots> slots{};
   for (std::size_t row = 0; row < keyMap.size(); ++row) {

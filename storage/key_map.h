@@ -7,8 +7,8 @@
 
 namespace tavrel {
 
-/// The row of the statistic of that name, null when it is not reported; in constant time. A name is
-/// the text of a list entry, and so never longer than the table can hold.
+/// The row of the statistic with that name, null when it is not reported; in constant time. A name
+/// comes from a list entry, so it is never longer than the table can hold.
 const KeyMapRow* findKeyMapRow(std::string_view name);
 
 }  // namespace tavrel

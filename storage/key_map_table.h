@@ -1,6 +1,6 @@
-// The key of the NAND information under which each statistic is reported.
+// The key under which the NAND information reports each statistic.
 //
-// A row is the name of a statistic (of an element of an array: the name and its index), and the key
+// A row has the name of a statistic (for an array element, the name and its index) and the key
 // without its prefix "com.norvane.NANDInfo.". No name occurs twice.
 #pragma once
 
@@ -16,7 +16,7 @@ struct KeyMapRow {
 
 // clang-format off
 inline constexpr auto keyMap = std::to_array<KeyMapRow>({
-    // A key of its own.
+    // A different key.
     {"staticSizeInMB", "StaticDataSizeInMB"},
     {"bdrPadding", "AgeInducedWriteSectors"},
     {"cntTimeWentBackWardOnBoot", "NumClockLoss"},
@@ -95,7 +95,7 @@ inline constexpr auto keyMap = std::to_array<KeyMapRow>({
     {"E2EDPErrorCounters11", "E2E_F2H_SL_UECC"},
     {"wcacheDS_Reads", "wcacheDSReads"},
     {"lhotSkipPrecent", "lhotSkipPercent"},
-    // The name with a capital.
+    // The name, capitalised.
     {"intermediateBandErases", "IntermediateBandErases"},
     {"numFlushes", "NumFlushes"},
     {"numFences", "NumFences"},

@@ -5,7 +5,7 @@
 namespace tavrel {
 namespace {
 
-// Both kinds of drivers have the same lists in the same format.
+// Both kinds of drivers offer the same lists in the same format.
 constexpr NandExporter exporterOf(std::string_view className, std::string_view characteristics,
                                   std::int32_t contentDeletionSelector, std::uint32_t sizeSelector,
                                   std::uint32_t dataSelector) {

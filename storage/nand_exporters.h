@@ -1,4 +1,4 @@
-// The kinds of storage drivers that publish statistics, and which of them this device has.
+// The kinds of storage drivers that publish statistics, and the search for this device's driver.
 #pragma once
 
 #include <cstdint>
@@ -12,10 +12,10 @@
 
 namespace tavrel {
 
-/// A kind of driver. Any getter may be null: the driver does not offer that list.
+/// A kind of driver. A null getter means that the driver does not offer that list.
 struct NandExporter {
   std::string_view className = {};                // the registry class of its service
-  std::string_view characteristicsProperty = {};  // of the service or its parents: a dictionary
+  std::string_view characteristicsProperty = {};  // a dictionary, on the service or its parents
   std::int32_t contentDeletionSelector = 0;       // method number; -1 when the driver has none
   std::uint32_t sizeSelector = 0;                 // method number of every size query
   std::uint32_t dataSelector = 0;                 // method number of every fetch

@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// Buffers of older versions have only the first figures.
+// Buffers of older versions contain only the first figures.
 constexpr std::uint32_t kFirstFullExportVersion = 0x20002;
 
 constexpr std::uint64_t kSecondsTo2000 = 946684800;  // since 1970
@@ -131,7 +131,7 @@ bool gather(Figures& figures, std::string_view name, std::uint64_t value) {
   return true;
 }
 
-// Sets the statistics that have a key and gathers the figures of the others.
+// Sets the statistics that have a key of their own, and combines the others into figures.
 Figures setStatistics(plist::Dictionary& info, const ASPContext& context) {
   Figures figures;
   std::string key(kNANDInfoKeyPrefix);
@@ -161,7 +161,7 @@ void setFigures(plist::Dictionary& info, const Figures& figures) {
 
 }  // namespace
 
-// Digits are counted with integers, because the C library's log10 need not be exact on every CPU.
+// Counts digits with integers, because the C library's log10 need not be exact on every CPU.
 std::int64_t roundMaximumDuration(std::uint64_t value) {
   const auto x = static_cast<std::uint32_t>(value);
   if (x < 100) return x;
@@ -169,7 +169,7 @@ std::int64_t roundMaximumDuration(std::uint64_t value) {
   while (x / power >= 1000)
     power *= 10;
   std::uint32_t figures = x / power;
-  // A value of three digits has the power 1 and the half 0: it comes out one higher.
+  // For a value of three digits, power is 1 and half of it 0, so the result is one higher.
   if (x - figures * power >= power / 2) ++figures;
   return std::int64_t{figures} * power;
 }

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-/// The prefix of all of them.
+/// The prefix of all keys.
 inline constexpr std::string_view kNANDInfoKeyPrefix = "com.norvane.NANDInfo.";
 
 // -- Fixed figures, in the order in which they are set ------------------------------------------
@@ -36,7 +36,7 @@ inline constexpr std::string_view kNANDInfoNumPhysicalErasesKey =
 inline constexpr std::string_view kNANDInfoNumNodesFreeKey = "com.norvane.NANDInfo.NodesFree";
 inline constexpr std::string_view kNANDInfoNumNodesTotalKey = "com.norvane.NANDInfo.NodesTotal";
 
-/// Whole weeks since 2000, in spite of its name.
+/// Whole weeks since 2000, despite the key's name.
 inline constexpr std::string_view kNANDInfoFormatWeeksSince2000Key =
     "com.norvane.NANDInfo.formatDaysSince2000";
 
@@ -64,7 +64,7 @@ inline constexpr std::string_view kNANDInfoMaintenanceFailedProgKey =
 inline constexpr std::string_view kNANDInfoMaintenanceFailedEraseKey =
     "com.norvane.NANDInfo.MaintenanceRequestsFailedErase";
 
-// -- Errors: a dictionary that holds the first of them holds nothing else but its message -------
+// -- Errors: a dictionary with the first key has no other entry than the message -----------------
 
 inline constexpr std::string_view kNANDInfoErrorKey = "com.norvane.NANDInfo.Error";
 inline constexpr std::string_view kNANDInfoErrorMessageKey = "com.norvane.NANDInfo.ErrorMessage";

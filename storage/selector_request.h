@@ -5,7 +5,7 @@
 //   const DeviceBuffer buffer = DeviceBuffer::allocate(size);
 //   fetchList(client, *exporter, SelectorRequest::fetch(table).bytes(), buffer.bytes(), length);
 //
-// A driver without selector tables gets no request at all.
+// A driver without selector tables is called without a request.
 #pragma once
 
 #include <array>
@@ -17,7 +17,7 @@
 
 namespace tavrel {
 
-/// The request that goes with a size query or a fetch.
+/// The request sent with a size query or a fetch.
 class SelectorRequest {
  public:
   /// 0: the selector (32 bits), 4: flags (16 bits), zeros to the end; little-endian.

@@ -1,8 +1,8 @@
-// Logs the lists of the storage driver. All their fields are little-endian.
+// Logs the storage driver's lists. All their fields are little-endian.
 //
 // A callback takes a list's buffer and the controller's characteristics, and returns whether the
 // list could be logged. Diagnostics go to standard error. Reading texts and making small
-// dictionaries cannot fail, so there are no diagnostics for them.
+// dictionaries cannot fail, so these steps have no diagnostics.
 #pragma once
 
 #include "base/bytes.h"
@@ -15,14 +15,14 @@ using ListCallback = bool (*)(Platform& platform, ByteSpan buffer,
                               const plist::Value& characteristics);
 
 /// Writes the validity of blocks by bucket, the write amplification and the NAND information to the
-/// NAND log, when this run needs it (`gNeedValidityList`).
+/// NAND log, if this run has to (`gNeedValidityList`).
 bool logValidityList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
 
 /// Files one structured record for each flash channel.
 bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
 
-/// Files the factory's count of bad blocks and one structured record for each defect that has grown
-/// since, as far as the buffer holds them.
+/// Files the factory's count of bad blocks, and one structured record for each grown defect that
+/// the buffer contains.
 bool logDefectsList(Platform& platform, ByteSpan buffer, const plist::Value& characteristics);
 
 }  // namespace tavrel

@@ -22,7 +22,8 @@ bool gNeedValidityList = false;
 
 namespace {
 
-/// Above this threshold the validity list is logged, unless a preference gives another one.
+/// The validity list is logged above this write amplification, unless a preference sets another
+/// threshold.
 constexpr double kDefaultThreshold = 2.0;
 
 /// The unit of write amplification in bytes, as a power of two.
@@ -73,7 +74,7 @@ bool exceedsThreshold(Platform& platform, float userAmplification) {
   return gCurrentUserWamp > kDefaultThreshold;
 }
 
-/// Sets the process-wide figures of this run, and decides whether it logs the validity list.
+/// Sets the process-wide figures for this run, and decides whether the run logs the validity list.
 void measureWriteAmplification(Platform& platform) {
   gCurrentUserWamp = gCurrentSysWamp = 0;
   const std::unique_ptr<ASPContext> context(new (std::nothrow) ASPContext());
@@ -131,8 +132,8 @@ class SelectorFunctions {
   std::size_t count_ = 0;
 };
 
-/// Fetches and logs one list. False when it could not be logged; true when the driver does not
-/// yield it.
+/// Fetches and logs one list. False when it could not be logged; true also when the driver does not
+/// deliver it.
 bool logList(Platform& platform, UserClient& client, const NandExporter& exporter,
              const SelectorFunction& function, std::int32_t index, bool requestFlag,
              const plist::Value& characteristics) {
@@ -159,7 +160,7 @@ bool logList(Platform& platform, UserClient& client, const NandExporter& exporte
     streams.printError("Could not retrieve data from driver for selector %u\n", table->fetch);
     return true;
   }
-  // The list is as long as the driver said before, however much it filled in; the rest is 0.
+  // The list is as long as the driver announced, however much it filled in; the rest is 0.
   return function.callback(platform, buffer.bytes(), characteristics);
 }
 

@@ -4,8 +4,8 @@
 //
 // Telemetry of the flash channels and the grown defects become structured records. The block
 // validity histogram goes to the NAND log when write amplification exceeds a threshold (the
-// preference "userWAmp" of domain "com.norvane.NANDInfo", a real number above 0 and below 10, else
-// 2.0) or collection is forced.
+// preference "userWAmp" of domain "com.norvane.NANDInfo", a real number above 0 and below 10,
+// otherwise 2.0), or when collection is forced.
 #pragma once
 
 #include "platform/platform.h"
@@ -13,11 +13,11 @@
 
 namespace tavrel {
 
-/// Writes to flash per write of the host in the last run; 0 when unknown.
+/// Flash writes per host write in the last run; 0 when unknown.
 extern double gCurrentUserWamp;
 /// The same within the intermediate bands.
 extern double gCurrentSysWamp;
-/// A client sets this to log the validity list whatever the write amplification is.
+/// Clients set this to log the validity list whatever the write amplification.
 extern bool gForceCollectionSet;
 /// Whether the last run had to log the validity list.
 extern bool gNeedValidityList;
@@ -26,8 +26,8 @@ extern bool gNeedValidityList;
 /// `requestFlag` is passed on to the driver. Diagnostics go to standard error.
 bool DumpStorageStructuredLog(Platform& platform, bool requestFlag);
 
-/// The same for the lists of a given service, as its row of the exporter table says, with the
-/// current figures.
+/// The same for the lists of a given service, whose row is `exporter`, with the current write
+/// amplification.
 bool logStorageLists(Platform& platform, DriverService& service, const NandExporter& exporter,
                      bool requestFlag);
 

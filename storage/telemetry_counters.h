@@ -30,10 +30,10 @@ struct CounterArrayShape {
   CounterArray array;
   std::string_view name;
   std::size_t size;       // in elements
-  std::size_t first = 0;  // element of the record with which it begins
+  std::size_t first = 0;  // index of its first element in the record
 };
 
-/// The arrays in their order.
+/// The arrays, in order.
 inline constexpr auto kCounterArrays = [] {
   using enum CounterArray;
   auto shapes = std::to_array<CounterArrayShape>({

@@ -18,21 +18,21 @@ namespace {
 constexpr std::int64_t kBlockBytes = kCounterBlockBytes;
 constexpr std::int64_t kChannelRecordBytes = 32;
 
-/// Longest text of a chip's identifier with its terminator, in bytes.
+/// Longest text of a chip's identifier, in bytes, with its terminator.
 constexpr std::int32_t kChipIDBytes = 64;
 
-/// The fields of a channel record, 32 bits each; the last 4 bytes are not read.
+/// The fields of a channel record, 32 bits each; the last 4 bytes are ignored.
 constexpr const char* kChannelFields[] = {"RD",  "PE",         "Max_PE_rate", "t0",
                                           "Ret", "block_type", "num_pages"};
 
-/// The characteristics that decide how to read a controller's telemetry.
+/// A controller's characteristics that determine how to read its telemetry.
 struct Controller {
   std::uint32_t generation;
   CounterParser parser;
   std::int32_t channels;
 };
 
-/// The text under a key; nothing, after a line that says why, when there is none.
+/// The text under a key; nothing, with a line that says why, when there is none.
 std::optional<std::string_view> textUnder(const char* key, const plist::Dictionary& dictionary,
                                           StandardStreams& streams) {
   if (!dictionary.contains(key)) {
@@ -74,7 +74,7 @@ std::optional<Controller> controllerOf(const plist::Value& characteristics,
                     channels->int32()};
 }
 
-/// An array whose counters a record shows.
+/// An array whose counters are part of a record.
 struct ShownArray {
   CounterArray array;
   std::size_t counters;  // the first ones of it

@@ -10,8 +10,8 @@
 namespace tavrel {
 namespace {
 
-// Header: the counts of records and of 8-byte items (32 bits each), 4 bytes that are not read. The
-// items are not read; the records follow them.
+// Header: the numbers of records and of 8-byte items (32 bits each), 4 ignored bytes. The items are
+// ignored; the records follow them.
 constexpr std::uint64_t kRecordCount = 0;
 constexpr std::uint64_t kItemCount = 4;
 constexpr std::uint64_t kHeaderBytes = 12;

@@ -28,7 +28,7 @@ struct Item {
   ByteSpan payload;
 };
 
-// The first of `items`, or nothing when it is truncated.
+// The first of `items`; nothing when it is truncated.
 std::optional<Item> frontItem(ByteSpan items) {
   if (items.size() < kItemHeaderBytes) return std::nullopt;
   const auto payload = slice(items, kItemHeaderBytes, *loadLittle32(items, 4));
@@ -39,7 +39,7 @@ std::optional<Item> frontItem(ByteSpan items) {
 // The state of a container whose end has not been reached.
 struct Level {
   std::uint64_t identifier;
-  ByteSpan statistics;   // without data when there are none
+  ByteSpan statistics;   // data is null when there are none
   bool isNamed = false;  // the last thread name is the wanted one
 };
 
@@ -52,7 +52,7 @@ bool ends(const Level& level, const std::optional<Item>& item) {
   return item->type == kContainerEnd && item->flags == level.identifier;
 }
 
-// Names of full length have no zero byte; they must be the beginning of `name`.
+// A name of full length has no zero byte; it must be the beginning of `name`.
 bool isName(ByteSpan payload, std::string_view name) {
   const auto text = asText(payload.first(std::min(payload.size(), kLongestName)));
   const std::size_t end = text.find('\0');
@@ -93,7 +93,7 @@ bool getIOStatsWithThreadnameFromKCDataHelper(ByteSpan items,
                                               ByteSpan* position) {
   if (!threadName) return false;
   const std::string_view name = threadName->substr(0, threadName->find('\0'));
-  // Not the machine's own stack: a snapshot decides how deep its containers nest.
+  // A stack of our own, not the call stack: the snapshot decides how deep containers nest.
   std::stack<Level> levels;
   for (ByteSpan rest = items;;) {
     const auto item = frontItem(rest);

@@ -28,7 +28,7 @@ struct ASPList {
 };
 
 struct ASPContext {
-  std::uint32_t exportVersion = 0;  // 0 as well when a record of the buffer was bad
+  std::uint32_t exportVersion = 0;  // also 0 when a record of the buffer was bad
   std::uint32_t driverVersion = 0;  // all ones once a buffer was parsed
   std::uint32_t numVirtualBlocks = 0;
   std::uint32_t blocksPerVirtualBlock = 0;
@@ -48,7 +48,7 @@ struct ASPContext {
   std::uint64_t maxHighEnduranceBlockErases = 0;
   std::array<std::uint64_t, 5> readCountHisto{};
 
-  // The two lists run in step: entry i of both describes the same statistic.
+  // The lists are parallel: entry i of both describes the same statistic.
   ASPList<ASPNameEntry> names;
   ASPList<ASPValueEntry> values;
 
@@ -56,7 +56,7 @@ struct ASPContext {
   ASPEntryArena arena;
 };
 
-/// Walks the lists in step, until either ends, with `visit(name, value entry)`.
+/// Calls `visit(name, value entry)` for each pair of entries, until either list ends.
 template <class Visit>
 void forEachStatistic(const ASPContext& context, Visit visit) {
   const ASPNameEntry* name = context.names.head;

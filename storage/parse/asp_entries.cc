@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-// Room for everything in a real buffer. Pages without entries cost nothing.
+// Enough for all entries of a real buffer. Pages without entries cost nothing.
 constexpr std::size_t kBlockPairs = 1400;
 
 }  // namespace

@@ -8,7 +8,7 @@
 
 namespace tavrel {
 
-/// A terminated text of at most 98 characters; bytes after its end are undefined.
+/// Zero-terminated text of at most 98 characters; bytes after its end are undefined.
 using ASPText = std::array<char, 100>;
 inline constexpr std::size_t kLongestASPText = 98;
 
@@ -42,8 +42,8 @@ class ASPEntryArena {
   ASPEntryArena& operator=(const ASPEntryArena&) = delete;
   ~ASPEntryArena();
 
-  /// Entries whose content is not set yet; null when memory is short or the limit on entries is
-  /// reached.
+  /// A pair of entries with content not set yet; null when memory runs out or the limit on entries
+  /// is reached.
   ASPEntryPair* allocate() {
     if (next_ == end_ && !grow()) return nullptr;
     return next_++;

@@ -12,9 +12,10 @@
 
 namespace tavrel {
 
-/// Adds the content of the buffer to the context. 1 when all records were consumed, otherwise 0:
-/// the buffer is shorter than a unit, a record is bad (the export version is then 0), or memory is
-/// short. Records before the failure stay. Bytes after the last whole unit are skipped.
+/// Adds the content of the buffer to the context. Returns 1 when all records were consumed,
+/// otherwise 0: the buffer is shorter than a unit, a record is bad (the export version is then 0),
+/// or memory runs out. Records before the failure are kept. Bytes after the last whole unit are
+/// skipped.
 int ASPParseBufferToCxt(ASPContext& context, ByteSpan buffer);
 
 /// Frees the entries and zeroes the whole context.
@@ -22,11 +23,11 @@ void ASPReleaseContext(ASPContext& context);
 
 /// Steps of the parser. They return false when an entry cannot be allocated.
 
-/// Stores and lists all values of one record, already limited to the statistic's cap.
+/// Stores and lists the values of one record, which the caller has limited to the statistic's cap.
 bool ASPRecordValues(ASPContext& context, std::uint32_t key, std::string_view name,
                      ByteSpan values);
 
-/// Lists a value under the name `prefix` + `suffix`, cut to 98 characters.
+/// Lists a value under the name `prefix` + `suffix`, truncated to 98 characters.
 bool ASPAppendEntry(ASPContext& context, std::string_view prefix, std::string_view suffix,
                     std::uint64_t value);
 

@@ -21,8 +21,8 @@ inline constexpr SelectorTable taskSchedulerSelectors{39, 39};
 inline constexpr SelectorTable snapshotSelectors{22, 22};
 inline constexpr SelectorTable snapshotHeaderSelectors{145, 145};
 
-/// The tables are constant for the life of the process. A getter of another kind of driver may
-/// return null: that driver has no such list.
+/// The tables are constants. A getter for another kind of driver may return null, when that driver
+/// has no such list.
 using SelectorGetter = const SelectorTable* (*)();
 
 const SelectorTable* ASPGetStatsSelectors();

@@ -26,7 +26,7 @@ void appendElements(std::string& out, const plist::Array& array) {
   }
 }
 
-// Appends "key:value;", or nothing for anything but a figure.
+// Appends "key:value;" for a number or an array with numbers, nothing for other values.
 void appendItem(std::string& out, const plist::Entry& entry) {
   const auto number = entry.value.number();
   const auto array = entry.value.array();
@@ -80,7 +80,7 @@ void writeLog(Platform& platform, std::string_view logType, const plist::Diction
   if (!statistics) return;
 
   const std::string text = repairedUtf8(logText(platform, now, statistics));
-  // The next attempt waits a whole period in any case, to spare a failing service.
+  // Whatever the result, the next attempt is a whole period later, to spare a failing service.
   platform.submission->ZTXWriteLogForSubmission(
       logType, kNandLogName, {}, [&text](LogFile& file) { file.write(asBytes(text)); });
   platform.preferences->ZTXPreferencesSetValue(kNandLogLastLoggedKey, now,

@@ -2,8 +2,8 @@
 //
 //   NLW_WriteLog(platform, "165", statistics);
 //
-// The log is a header that names the device and the moment, a blank line, and one line with every
-// statistic that is a number or a list of them: "IntermediateWamp:1.37;ValidityList[0]:12,40,7".
+// The log is a header with the device and the time, a blank line, and one line with every statistic
+// that is a number or a list of numbers: "IntermediateWamp:1.37;ValidityList[0]:12,40,7".
 #pragma once
 
 #include <cstdint>
@@ -21,17 +21,17 @@ inline constexpr std::string_view kNandLogName = "StorageStatus";
 inline constexpr std::string_view kDefaultPreferenceDomain = "com.norvane.zentrix.tavrel";
 inline constexpr std::string_view kNandLogLastLoggedKey = "SSLastLoggedAt";
 
-/// The least time from one log to the next, in seconds.
+/// The shortest time between two logs, in seconds.
 inline constexpr double kNandLogPeriod = 604800;
 
-/// Writes the log unless the last one is younger than the period or is dated later than now. An
-/// empty handle for `statistics` writes nothing. The date of the log is stored whether or not the
+/// Writes the log unless the last one is younger than the period or dated in the future. Writes
+/// nothing for an empty `statistics` handle. The date of the log is stored whether or not the
 /// submission service accepted it. A `PlatformException` of a service is logged and ends the call;
 /// other exceptions pass through.
 void NLW_WriteLog(Platform& platform, std::string_view logType,
                   const plist::Dictionary& statistics);
 
-/// The device's inverse identifier, "error" when the device does not answer.
+/// The device's inverse identifier; "error" when the device does not answer.
 std::string GetFaultlineKey(DeviceAnswers& deviceAnswers);
 
 }  // namespace tavrel

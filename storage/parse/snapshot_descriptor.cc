@@ -36,7 +36,7 @@ std::optional<std::string_view> terminatedText(ByteSpan bytes) {
   return text.substr(0, end);
 }
 
-// Fails when the bytes at an offset in the last record are not all in the buffer.
+// Fails when some of the bytes at an offset in the last record are outside the buffer.
 Status checkRead(const SnapshotDescriptor& layout, std::size_t recordBytes, std::size_t field,
                  std::uint64_t offset, std::uint64_t bytes) {
   if (layout.count == 0 || bytes == 0) return Done{};

@@ -1,5 +1,5 @@
 // The descriptor that a storage controller supplies with snapshot records of any size: the number
-// of records, and the place, kind and format of each field.
+// of records, and the location, kind and format of each field.
 //
 // Little-endian, offsets in bytes from its start:
 //
@@ -27,21 +27,21 @@
 
 namespace tavrel {
 
-/// A descriptor that can be trusted. Texts are borrowed from its bytes.
+/// A checked descriptor. Texts are borrowed from its bytes.
 struct SnapshotDescriptor {
-  std::optional<std::string_view> key;  // printed in place of the usual key of the columns
+  std::optional<std::string_view> key;  // printed instead of the usual key of the columns
   std::size_t stride;                   // bytes from one record to the next
   std::size_t count;                    // of records
   std::uint32_t presenceOffset;         // of the word that is 0 in an unused record
-  std::vector<SnapshotField> fields;    // that print something
+  std::vector<SnapshotField> fields;    // only those that print something
 };
 
-/// Checks a descriptor against itself and against the size of its records' buffer: all reads of all
-/// records must lie in the buffer. Records may overlap, and the last may be cut after its last
-/// read. Refuses, with the reason, a descriptor that leads outside the buffer or itself, a text
+/// Checks a descriptor for consistency and against the size of the records' buffer: all reads of
+/// all records must lie in the buffer. Records may overlap, and the last may end after its last
+/// read. Refuses, with the reason, a descriptor with an offset outside the buffer or itself, a text
 /// without its zero byte, a table without fields when there are records (the first field says which
-/// are used), and a format that needs arguments other than its kind gives: numbers for kinds 0 to
-/// 2, a text for kind 3, no widths. A format may take fewer arguments than there are.
+/// are used), and a format that needs other arguments than its kind provides: numbers for kinds 0
+/// to 2, a text for kind 3, no widths. A format may take fewer arguments than provided.
 Expected<SnapshotDescriptor> readSnapshotDescriptor(ByteSpan descriptor, std::size_t recordBytes);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// One field of a snapshot record: where its value is and how it is printed.
+// One field of a snapshot record: the location of its value and how to print it.
 #pragma once
 
 #include <cstddef>
@@ -23,7 +23,7 @@ struct SnapshotField {
   std::uint32_t offset;   // of its value in a record, in bytes
   std::uint32_t triples;  // of latencies
   std::string_view format;
-  std::size_t arguments;  // that the format takes, out of those of its kind
+  std::size_t arguments;  // how many of its kind's arguments the format takes
 
   /// How many bytes of a record are read from `offset` on.
   constexpr std::uint64_t bytesRead() const {
@@ -31,8 +31,8 @@ struct SnapshotField {
   }
 };
 
-/// How many arguments a format takes. Nothing when it takes more than `given`, others than `type`,
-/// or a width from an argument, which no field has.
+/// How many arguments a format takes. Nothing when it takes more than `given`, other types than
+/// `type`, or a width from an argument, which no field provides.
 constexpr std::optional<std::size_t> argumentsTaken(std::string_view format, ArgumentType type,
                                                     std::size_t given) {
   std::size_t taken = 0;
@@ -50,9 +50,8 @@ constexpr std::optional<std::size_t> argumentsTaken(std::string_view format, Arg
   return taken;
 }
 
-/// The field, or nothing when its format needs arguments that its kind does not give. The format is
-/// borrowed. `size` is that of the latencies, in bytes; a rest after the last whole triple is
-/// ignored.
+/// The field, or nothing when its format needs arguments that its kind does not provide. Borrows
+/// the format. `size` is that of the latencies, in bytes; an incomplete last triple is ignored.
 constexpr std::optional<SnapshotField> makeSnapshotField(SnapshotFieldKind kind,
                                                          std::uint32_t offset, std::uint32_t size,
                                                          std::string_view format) {

@@ -7,7 +7,7 @@ namespace {
 
 // The numbers at one position in all triples of a field.
 struct LatencyRun {
-  const char* name;  // what the field's format is applied to
+  const char* name;  // argument of the field's format
   FormatOf<std::uint32_t> first;
   FormatOf<std::uint32_t> further;
 };
@@ -18,7 +18,7 @@ constexpr LatencyRun kLatencyRuns[] = {
     {"M", "%5u", "/%5u"},  // maximum
 };
 
-// The descriptor was checked: every field lies in the buffer.
+// The descriptor has been checked, so every field lies in the buffer.
 std::uint32_t wordAt(ByteSpan record, std::uint64_t offset) {
   return *loadLittle32(record, offset);
 }

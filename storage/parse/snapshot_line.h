@@ -14,11 +14,11 @@ namespace tavrel {
 
 class SnapshotWriter {
  public:
-  /// The buffer is borrowed; its last byte is for the zero byte after the text.
+  /// Borrows the buffer, whose last byte is reserved for a terminating zero byte.
   explicit SnapshotWriter(std::span<char> buffer) : rest_(buffer), capacity_(buffer.size()) {}
 
-  /// Adds a piece. False when there is no room for all of it and a zero byte; the buffer then ends
-  /// with as much of it as fits.
+  /// Adds a piece. False when the piece and a zero byte do not fit; as much as fits has then been
+  /// added.
   bool write(std::string_view piece);
 
   /// Adds the fields of one record and a line end. All fields must lie in the record.
@@ -33,7 +33,7 @@ class SnapshotWriter {
 
   std::span<char> rest_;
   std::size_t capacity_;
-  std::string piece_;  // reused from piece to piece
+  std::string piece_;  // reused for each piece
 };
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The fixed snapshot record, 63 little-endian 32-bit words, and the line that shows it.
+// The fixed snapshot record, 63 little-endian 32-bit words, and the line that represents it.
 #pragma once
 
 #include <array>
@@ -14,7 +14,7 @@ inline constexpr std::size_t kSnapshotRecordBytes = 252;
 
 namespace snapshot_record {
 
-// A format that does not suit its field does not compile.
+// A format that does not fit its field does not compile.
 consteval SnapshotField field(SnapshotFieldKind kind, std::uint32_t word, std::uint32_t size,
                               std::string_view format) {
   return makeSnapshotField(kind, word * 4, size, format).value();
@@ -32,8 +32,8 @@ consteval SnapshotField latencies(std::uint32_t word, std::string_view format) {
 
 }  // namespace snapshot_record
 
-/// The columns in the order of the line; the first figure is the word in the record. Words that are
-/// not listed are not printed.
+/// The columns in the order of the line; the first number is the index of the word in the record.
+/// Unlisted words are not printed.
 inline constexpr std::array kSnapshotRecordFields{
     snapshot_record::number(0, "T=%04u"),
     snapshot_record::number(26, " E=%02u"),
@@ -64,8 +64,8 @@ inline constexpr std::array kSnapshotRecordFields{
     snapshot_record::latencies(2, " W%s="),
 };
 
-/// The key of the columns. Readers of these tables rely on every letter of it, including the
-/// missing line before "S".
+/// The key of the columns. Readers of these tables rely on every character of it, including the
+/// missing line break before "S".
 inline constexpr std::string_view kSnapshotColumnKey =
     "Key: \n"
     "T   - Timestamp\n"

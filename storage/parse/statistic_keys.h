@@ -1,6 +1,6 @@
-// The statistics that the storage controller is known to report.
+// The known statistics of the storage controller.
 //
-// A row is the number of a statistic, its name, and, for a statistic with several values, the most
+// A row has the number of a statistic, its name and, for a statistic with several values, the most
 // values taken from a record. Statistics with other numbers are skipped. The rows ascend.
 #pragma once
 
