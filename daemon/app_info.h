@@ -8,12 +8,12 @@
 
 namespace tavrel {
 
-/// The text of a UUID that is given as 16 bytes or as text; nothing for any other value.
+/// The text of a UUID given as 16 bytes or as text; nothing for any other value.
 std::optional<std::string> appUuidFrom(const plist::Value& value);
 
-/// The entries of the log from the elements of "app_data", in their order. An element that is no
-/// dictionary or lacks its identifier, its version or its UUID (16 bytes, or their text) is left
-/// out; a missing number reads as 0.
+/// Converts the elements of "app_data" to entries of the log, in order. Leaves out an element that
+/// is no dictionary or lacks its identifier, version or UUID (16 bytes, or their text); a missing
+/// number reads as 0.
 plist::Array appInfoFrom(const plist::Array& appData);
 
 }  // namespace tavrel

@@ -25,7 +25,7 @@ void announce(Platform& platform) {
   platform.log->log(LogLevel::Default, "notified of logging status, waiting for activate app info");
 }
 
-/// The low half of an integer entry.
+/// The low 32 bits of an integer entry.
 std::optional<std::int32_t> integerIn(const plist::Dictionary& message, std::string_view entry) {
   const auto number = message.number(entry);
   if (!number || number->isFloating()) return std::nullopt;

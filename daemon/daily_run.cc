@@ -81,7 +81,7 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
   if (hasRun) noteDaysPassedOver(platform.log, lastRunDay, yesterday);
   const LogOutcome outcome = dailyTasksForDay(platform, yesterday, appInfo, onStep);
   beginStep(onStep, "End of the gated run");
-  // What the tasks have set must not be lost once the day counts as done.
+  // Values that the tasks have set must not be lost once the day counts as done.
   bool isKept = false;
   runGuarded(platform.log, "checkpoint the store after the tasks",
              [&] { isKept = platform.statistics->BHClientCheckpoint(); });

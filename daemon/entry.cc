@@ -29,7 +29,7 @@ constexpr std::string_view kHelp =
     "(default: /). The exit status is always 0. See tavrel(8). tavrelctl(1) shows\n"
     "what a run would do and has done.\n";
 
-// True when the wait ended because nothing happened, false when the system ended it.
+// True when the wait ended for lack of events, false when the system ended it.
 bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {
   while (true) {
     switch (loop.runSlice(idleSlice)) {
@@ -45,7 +45,7 @@ bool waitUntilIdle(EventLoop& loop, std::chrono::milliseconds idleSlice) {
 
 void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
   const auto listener = startAppInfoListener(platform);
-  bool isIdle = true;  // also when a message could not be handled to its end
+  bool isIdle = true;  // stays true when the handling of a message throws
   runGuarded(platform.log, "go on serving",
              [&] { isIdle = waitUntilIdle(platform.eventLoop, idleSlice); });
   if (!isIdle || !platform.state->appInfoRequested) return;

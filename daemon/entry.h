@@ -1,4 +1,4 @@
-// The entry point that `main` calls: runs what the command line asks for.
+// The entry point, called by `main`: does what the command line asks for.
 #pragma once
 
 #include <chrono>
@@ -8,7 +8,7 @@
 
 namespace tavrel {
 
-/// How long the service waits for an event before it ends.
+/// How long the service waits without an event before it ends.
 inline constexpr std::chrono::milliseconds kIdleSlice{10'000};
 
 /// Runs the process. `arguments` begins with the program's name. Without an argument it serves

@@ -16,8 +16,8 @@
 
 namespace {
 
-/// The run must go on when the reader of standard error has gone. A log line must not end up in a
-/// data file that got the number of a standard stream closed at the start.
+/// The run must go on when the reader of standard error has gone. And if a standard stream is
+/// closed at the start, no data file may take its number and receive log lines.
 void secureStandardStreams() {
   std::signal(SIGPIPE, SIG_IGN);
   int descriptor = 0;
@@ -26,7 +26,7 @@ void secureStandardStreams() {
   if (descriptor >= 0) close(descriptor);
 }
 
-// A line takes memory, of which there may be none left.
+// A log line needs memory, of which there may be none left.
 void tellEnd(const std::exception& error) {
   try {
     tavrel::LinuxSystemLog().log(tavrel::LogLevel::Error, "run ended early: %s", error.what());
@@ -44,7 +44,8 @@ std::string_view taskOf(int argc, char** argv) {
 
 }  // namespace
 
-// The exit status is always 0: a failed run is not restarted, the next day runs again.
+// The exit status is always 0: a failed run must not be restarted; there is another run the next
+// day.
 int main(int argc, char** argv) {
   using namespace tavrel;
   secureStandardStreams();
@@ -59,7 +60,7 @@ int main(int argc, char** argv) {
     LinuxClock clock;
     RunMemory memory(root, clock, systemLog, taskOf(argc, argv));
     try {
-      // Its end writes what the run has changed, which may fail like everything else.
+      // Inside the try block, because its destructor writes the run's changes, which may fail too.
       LinuxPlatform linuxPlatform(std::move(root), {.log = &memory});
       runTavrel(linuxPlatform.platform(),
                 std::span<const char* const>(argv, static_cast<std::size_t>(argc)));

@@ -12,7 +12,7 @@ namespace {
 constexpr std::string_view kTaskingChanged = "com.norvane.da.tasking_changed";
 constexpr std::string_view kAggressiveDaysValue = "AggressiveSubmissionDays";
 
-/// Writes preferences and remembers the domains, each of which is synchronised once.
+/// Writes preferences, and synchronises each changed domain once.
 class PreferenceWriter {
  public:
   explicit PreferenceWriter(Preferences& preferences) : preferences_(preferences) {}
@@ -51,7 +51,7 @@ plist::Value ownPreference(Platform& platform, std::string_view key) {
   return platform.preferences->ZTXPreferencesGetValue(key, kTavrelDomain);
 }
 
-/// Null when it is not known.
+/// The OS build; null when unknown.
 plist::Value systemBuild(Platform& platform) {
   return platform.systemVersion->systemVersionDictionary().get(kProductBuildVersionKey);
 }
@@ -81,7 +81,8 @@ struct TaskingPlan {
   std::string refusal;
 
  private:
-  /// Empty when it can be. Settings that are applied and not remembered could never be undone.
+  /// Empty when the tasking can be remembered. Settings that were applied without that could never
+  /// be undone.
   std::string whyNotRemembered(PropertyListCoding& propertyLists) const {
     if (!scheduled.array(kTaskingPayloadKey)) return {};  // no settings to remember
     auto kept = plist::Dictionary::create();
