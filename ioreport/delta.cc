@@ -88,7 +88,7 @@ KernelReturn subtractElements(const Triple& elements,
   return kKernelSuccess;
 }
 
-// Reports no error text: for these formats, the caller has none either.
+// Returns only a code, because no text describes these failures.
 KernelReturn subtract(std::uint8_t format, const plist::Dictionary& previous,
                       const plist::Dictionary& current, const plist::Dictionary& result) {
   if (format == kFormatSimple) {
