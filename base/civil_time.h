@@ -33,7 +33,8 @@ struct CivilTime {
 CivilDate civilFromDays(std::int64_t days);
 std::int64_t daysFromCivil(const CivilDate& date);
 
-/// Converts seconds since 1970-01-01 00:00:00 UTC to a date's fields and back, for any 64 bits.
+/// Converts seconds since 1970-01-01 00:00:00 UTC to a date's fields and back, for any 64-bit
+/// value.
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 

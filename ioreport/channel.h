@@ -1,6 +1,6 @@
 // The channel: a dictionary with the publisher, the ID, the type and the name of a quantity.
 //
-// A channel's legend is an array of its id, its type and, if it has one, its name. It belongs to
+// A channel's legend is an array of its ID, its type and, if it has one, its name. It belongs to
 // its publisher and is shared between the channel, its copies and its samples, so `setChannelType`
 // gives the channel a legend of its own before changing it. The getters cache their results in the
 // channel and return texts borrowed from it.
@@ -48,7 +48,7 @@ std::int64_t integerOf(const std::optional<plist::Number>& number);
 plist::Array createLegendChannel(std::uint64_t channelID, std::uint64_t channelType,
                                  std::optional<std::string_view> channelName, ErrorOut error);
 
-/// A new channel that shares the legend and the info; an empty handle for a legend without id or
+/// A new channel that shares the legend and the info; an empty handle for a legend without ID or
 /// type. Group and subgroup are texts or null.
 plist::Dictionary createChannel(std::uint64_t driverID, std::string_view driverName,
                                 const plist::Array& legendChannel, const plist::Value& group,
@@ -73,7 +73,7 @@ std::int64_t IOReportChannelGetUnit(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetDriverName(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetGroup(const plist::Dictionary& channel);
 std::optional<std::string_view> IOReportChannelGetSubGroup(const plist::Dictionary& channel);
-/// The name in the legend, otherwise the id when it spells one.
+/// The name in the legend, otherwise the ID when it spells one.
 std::optional<std::string_view> IOReportChannelGetChannelName(const plist::Dictionary& channel);
 
 /// The characters that an ID spells, from its highest byte down and without zero bytes; nothing

@@ -2,7 +2,7 @@
 //
 //   offset  size
 //        0     8  provider ID: the driver's
-//        8     8  channel id
+//        8     8  channel ID
 //       16     8  channel type; it counts the elements of the channel
 //       24     8  timestamp, unsigned, in the kernel's time base
 //       32    32  four values, whose meaning depends on the format

@@ -63,7 +63,7 @@ IterateResult IOReportMergeChannels(const plist::Dictionary& destination,
 /// copy shares the content of its channel. An empty handle when the walk fails.
 plist::Dictionary cloneAggregate(const plist::Dictionary& aggregate, const CloneCallback& callback);
 
-/// The same, but pairs each channel with the one of `other` that has the same driver, id and type,
+/// The same, but pairs each channel with the one of `other` that has the same driver, ID and type,
 /// and passes both to the callback. A channel without a match is copied unchanged. The copy of a
 /// matched channel has the elements of the match, with all values invalid.
 plist::Dictionary compareAggregates(const plist::Dictionary& other,

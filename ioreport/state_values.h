@@ -16,7 +16,7 @@ namespace tavrel {
 std::int32_t IOReportStateGetCount(const plist::Dictionary& channel);
 
 std::int64_t IOReportStateGetIDForIndex(const plist::Dictionary& channel, std::int32_t index);
-/// The last state that has the id.
+/// The last state that has the ID.
 std::int32_t IOReportStateGetIndexForID(const plist::Dictionary& channel, std::int64_t stateID);
 
 /// The name that the state's ID spells, borrowed from the channel, which caches the names of all

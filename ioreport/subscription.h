@@ -78,7 +78,7 @@ class InterestList {
   std::size_t completeBytes_;
 };
 
-/// Nothing when one of the channels lacks an id or a type, or there are more channels than the hub
+/// Nothing when one of the channels lacks an ID or a type, or there are more channels than the hub
 /// accepts.
 std::optional<InterestList> createInterestList(const plist::Dictionary& channels,
                                                std::int32_t count);

@@ -1,4 +1,4 @@
-// Every service that the system needs of an operating system, in one bundle of references.
+// Every service that the program needs from an operating system, in one bundle of references.
 //
 // It is built once, by main, over the services of one platform. An operation that needs several
 // services takes `Platform&`; one that needs a single service takes that service.

@@ -15,12 +15,12 @@ inline constexpr std::uint32_t kIOReportUserClientOpen = 0;
 inline constexpr std::uint32_t kIOReportUserClientConfigureInterests = 2;
 inline constexpr std::uint32_t kIOReportUserClientUpdateKernelBuffer = 3;
 
-/// Channels of interest: their number (32 bits) and 32 zero bits, then for each the driver id, the
-/// channel id and the channel type (64 bits each).
+/// Channels of interest: their number (32 bits) and 32 zero bits, then for each the driver ID, the
+/// channel ID and the channel type (64 bits each).
 inline constexpr std::size_t kInterestHeaderBytes = 8;
 inline constexpr std::size_t kInterestBytes = 24;
 
-/// The elements in which values arrive: ids, type, timestamp and values, of 64 bits each. The first
+/// The elements in which values arrive: IDs, type, timestamp and values, of 64 bits each. The first
 /// byte of the type is the format; 16 of its bits are the number of elements in the channel's
 /// group, which begins with this element.
 inline constexpr std::size_t kElementBytes = 64;

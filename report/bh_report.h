@@ -53,7 +53,7 @@ class BHReport {
   void computeAndAddDistribution(BHHistoryDistributionEnumerator& values, std::string_view forKey,
                                  const plist::Dictionary& withOptions);
 
-  // Probes: what the daemon measures itself. Each scalar is measured only when it is whitelisted.
+  // Probes: the daemon's own measurements. Each scalar is measured only when it is whitelisted.
 
   /// Counts of all installed applications and of those that the user installed.
   void addInstalledAppInfo();

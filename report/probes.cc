@@ -1,4 +1,4 @@
-// The probes of the report: what the daemon measures itself when a log is serialised.
+// The probes of the report: the daemon's own measurements when a log is serialised.
 #include <array>
 #include <optional>
 #include <string>
@@ -92,8 +92,8 @@ void BHReport::reportDatabaseSize() {
   addScalarForKey(kCorruptionsKey, [this] { return takeCorruptionCount(); });
 }
 
-// Reads and resets the count. The next synchronisation of its domain writes the preference back, at
-// the latest at the end of the process.
+// Reads and resets the count. The preference is written at the next synchronisation of its domain,
+// at the latest when the process ends.
 std::int64_t BHReport::takeCorruptionCount() {
   if (!findFaultlinePreferences(platform_)) return 0;
   const ProcessState& state = platform_.state;

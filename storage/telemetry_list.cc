@@ -77,7 +77,7 @@ std::optional<Controller> controllerOf(const plist::Value& characteristics,
 /// An array whose counters are part of a record.
 struct ShownArray {
   CounterArray array;
-  std::size_t counters;  // the first ones of it
+  std::size_t counters;  // how many, from its beginning
 };
 
 std::vector<ShownArray> shownArrays(std::uint32_t generation) {

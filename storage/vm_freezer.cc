@@ -108,7 +108,7 @@ bool getIOStatsWithThreadnameFromKCDataHelper(ByteSpan items,
         if (level.statistics.data()) ioStatistics = level.statistics;
         return true;
       }
-      if (!item) continue;  // it ends the outer levels as well
+      if (!item) continue;  // the end of `items` ends the outer levels too
     } else if (beginsContainer(*item)) {
       levels.push({.identifier = item->flags, .statistics = {}});
     } else if (!levels.empty() && item->type == kThreadName) {

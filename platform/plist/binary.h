@@ -7,7 +7,7 @@
 //   const auto document = plist::readBinary(bytes);
 //   if (!document) log(document.error().message);  // "binary property list, offset 8: ..."
 //
-// What is written reads back equal, except for malformed UTF-8: each such byte becomes U+FFFD (keys
+// Written values read back equal, except for malformed UTF-8: each such byte becomes U+FFFD (keys
 // that become equal are distinguished as in platform/plist/xml.h). Floats and doubles keep their
 // kind; integers are read as 64-bit integers.
 #pragma once

@@ -18,7 +18,7 @@ bool isEncodable(std::string_view text, Alphabet alphabet);
 /// The text with U+FFFD for each malformed byte and each character that the alphabet lacks.
 std::string encodable(std::string_view text, Alphabet alphabet);
 
-/// Appends what `encodable` gives for the alphabet Xml, with markup characters escaped. A carriage
+/// Appends the text as `encodable` with the alphabet Xml, and escapes markup characters. A carriage
 /// return is escaped too: parsers turn a plain one into a line feed.
 void appendXmlText(std::string& out, std::string_view text);
 

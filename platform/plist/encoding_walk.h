@@ -51,7 +51,7 @@ class SortedEntries {
 
   explicit SortedEntries(Alphabet alphabet) : alphabet_(alphabet) {}
 
-  /// Puts the entries on top and yields the index of the first.
+  /// Pushes the entries and returns the index of the first.
   std::size_t push(const Dictionary& dictionary);
   void popTo(std::size_t first) { items_.resize(first); }
 

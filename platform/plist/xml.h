@@ -8,7 +8,7 @@
 //   const auto document = plist::readXml(bytes);
 //   if (!document) log(document.error().message);  // "XML property list, line 3, column 7: ..."
 //
-// What is written reads back equal, except for what XML cannot hold:
+// Written values read back equal, except for what XML cannot hold:
 //   - control characters (other than tab, line feed and carriage return), U+FFFE, U+FFFF and
 //     malformed UTF-8 become U+FFFD. The later of keys that become equal get a number: "a\x01",
 //     "a\x02" are written as "a\uFFFD", "a\uFFFD2";

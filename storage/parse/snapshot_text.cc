@@ -38,7 +38,7 @@ int ASPParseSnapshotBufferWithInplaceParser(ByteSpan records, std::span<char> te
   for (std::size_t i = 0; i < layout->count; ++i) {
     const ByteSpan record = records.subspan(i * layout->stride);
     if (loadLittle32(record, layout->presenceOffset) == 0U) {
-      if (layout->stride == 0) break;  // as all others are
+      if (layout->stride == 0) break;  // all records are this one
       continue;
     }
     if (!out.writeLine(layout->fields, record)) return 0;

@@ -78,8 +78,8 @@ std::string LinuxSystemVersion::text() {
 const plist::Dictionary& LinuxSystemVersion::known() {
   if (known_) return known_;
   const std::string path = root_.path(kVersionFile);
-  // A file that exists and cannot be read leaves the version unknown: that of os-release would look
-  // like an update of the OS.
+  // A file that exists but cannot be read leaves the version unknown: the one in os-release would
+  // look like an update of the OS.
   const auto content = files_.readIfPresent(path, limits::kPropertyListBytes);
   const bool isMissing = content && !*content;
   known_ = isMissing ? fromOsRelease()

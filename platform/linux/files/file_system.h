@@ -49,8 +49,8 @@ class NewFile {
   Status write(ByteSpan bytes);
   /// Flushes the content to storage; the file keeps its temporary name.
   Status flush();
-  /// Flushes, gives the file its name in place of an earlier file, and makes that durable. When
-  /// only the last step fails, the file is in place but may not survive a power cut.
+  /// Flushes the file, renames it over an earlier one, and makes that durable. When only the last
+  /// step fails, the file is in place but may not survive a power cut.
   Status commit();
 
  private:
@@ -93,7 +93,7 @@ class AppendedFile {
   std::string path_;
   Descriptor descriptor_;
   std::uint64_t size_ = 0;  // of the whole lines
-  bool isTorn_ = false;     // something follows them
+  bool isTorn_ = false;     // there is more after them
   bool isFlushed_ = false;
   bool isNameFlushed_ = false;
 };

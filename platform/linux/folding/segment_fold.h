@@ -1,4 +1,4 @@
-// Moves what programs recorded from their segments into the statistics store, exactly once.
+// Moves recorded values from programs' segments into the statistics store, exactly once.
 //
 //   SegmentFold fold(root, store, files, propertyLists, log);
 //   const FoldReport report = fold.run();
@@ -31,7 +31,7 @@ struct FoldReport {
   std::uint64_t dropped = 0;           // values for which the programs had no room
   std::uint64_t refused = 0;           // values that were not taken
   std::uint64_t segmentsRefused = 0;   // files refused for the first time
-  std::optional<std::string> failure;  // why the fold ended early: what is left waits
+  std::optional<std::string> failure;  // why the fold ended early; the rest waits
 };
 
 class SegmentFold {

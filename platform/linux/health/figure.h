@@ -1,8 +1,8 @@
 // Health figures of drives: their names, sources and meanings.
 //
-// Each kind of drive has tables of `FigureKind`, which drive its reader, the tool's documents and
-// the stored readings. A figure that a drive does not report is absent; there is no value for
-// "unknown".
+// Tables of `FigureKind` for each kind of drive define what its reader, the tool's documents and
+// the stored readings contain. A figure that a drive does not report is absent; there is no value
+// for "unknown".
 #pragma once
 
 #include <cstdint>

@@ -13,7 +13,7 @@ namespace tavrel::health {
 /// be read or is empty. At most 4 KiB are read, and only of a regular file.
 std::optional<std::string> readAttribute(const std::string& path);
 
-/// A decimal number that is the whole text.
+/// The whole text as a decimal number, not negative; nothing for other text.
 std::optional<std::int64_t> decimalOf(std::string_view text);
 std::optional<std::int64_t> readNumber(const std::string& path);
 

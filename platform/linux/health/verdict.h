@@ -1,4 +1,4 @@
-// What the figures of a drive amount to.
+// The verdict on a drive, from its figures.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +9,7 @@
 
 namespace tavrel::health {
 
-/// Bits, also of the exit status of `tavrelctl disks`. The lowest two are the tool's own.
+/// Bits, also in the exit status of `tavrelctl disks`, whose lowest two bits are the tool's own.
 enum Problem : std::uint8_t {
   kUnread = 4,   // the drive could not be read, or has not been read yet
   kFailing = 8,  // the drive itself says that it fails

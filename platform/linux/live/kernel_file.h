@@ -1,4 +1,4 @@
-// Files of the kernel, which are read again and again and stay open between readings.
+// Kernel files, which are read repeatedly and stay open between readings.
 #pragma once
 
 #include <cstddef>

@@ -12,7 +12,7 @@
 
 namespace tavrel::live {
 
-/// A value that is not known. Readers of channels take it as absent.
+/// An unknown value. Readers of channels treat it as absent.
 inline constexpr std::int64_t kUnset = INT64_MIN;
 
 /// Converts the kernel's number to the channel's unit.
@@ -46,10 +46,10 @@ std::string channelName(std::string_view kernelName);
 /// IDs that would be equal begin with their index, as in "2:C6".
 std::vector<std::uint64_t> stateIDs(std::span<const std::string> names);
 
-/// "1800MHz" for frequencies in whole megahertz, otherwise in whole kilohertz "1800500k".
+/// "1800MHz" for frequencies in whole megahertz, otherwise in kilohertz, "1800500k".
 std::string frequencyName(std::int64_t kilohertz);
 
-/// The same text always has the same id, a positive number other than 0.
+/// An ID for a text, the same in every process; a positive number.
 std::uint64_t stableID(std::string_view text);
 
 }  // namespace tavrel::live

@@ -28,7 +28,7 @@ namespace tavrel::live {
 inline constexpr std::uint16_t kToolCategory = 0x0001;
 inline constexpr std::uint16_t kDailyCategory = 0x0100;
 
-/// The formats of channels, by their number in a legend.
+/// Channel formats, with their numbers in legends.
 enum class ChannelFormat : std::uint8_t { Simple = 1, State = 2, SimpleArray = 4 };
 
 /// Where a channel is filed, and its unit.

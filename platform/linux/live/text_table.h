@@ -37,7 +37,7 @@ struct Cell {
   Scale scale = {};
 };
 
-/// Reads rows that are known by their keys; figures of rows that share slots add up.
+/// Reads the rows whose keys were added; figures of rows that share slots add up.
 class TableReader final : public TextReader {
  public:
   TableReader(TableForm form, std::vector<Cell> cells) : form_(form), cells_(std::move(cells)) {}

@@ -14,8 +14,8 @@ namespace tavrel {
 /// 3. the language without a region;
 /// 4. the language as in its home region (pt-BR for pt), then as in any other.
 ///
-/// Equally good ones keep the order of `available`. A language in a script other than the preferred
-/// one never suits; a script that is not named is the usual one of the region (zh-TW is
+/// Equally good languages keep the order of `available`. A language in a script other than the
+/// preferred one never suits; a script that is not named is the usual one of the region (zh-TW is
 /// zh-Hant-TW). When nothing suits, the result is the first of `available`, the language of
 /// untranslated texts. Without preferred languages the result is empty. Both lists are read up to
 /// `limits::kLanguages`.

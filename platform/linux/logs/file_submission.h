@@ -85,7 +85,7 @@ class FileSubmission final : public SubmissionService {
   /// Where a log made now, from the rows read last, would go; an error when it would not be filed.
   Expected<Place> placeOfNewLog();
 
-  /// Whether `submitDiagnosticLogs` sends anything on.
+  /// Whether `submitDiagnosticLogs` may send logs on.
   bool maySendOn() const { return static_cast<bool>(checkPermission()); }
   /// How many logs a run without permission would delete; 0 while storage has one or cannot be
   /// read.

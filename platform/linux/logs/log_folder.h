@@ -1,4 +1,4 @@
-// Folders of submitted logs: each log with its metadata beside it. Files of other names are left
+// Folders of submitted logs: each log with its metadata beside it. Files with other names are left
 // alone.
 #pragma once
 

@@ -1,4 +1,4 @@
-// The content of a registry's recordings, merged and indexed: services by entry id and by class,
+// The content of a registry's recordings, merged and indexed: services by entry ID and by class,
 // and the channels of the hub. docs/registry.md describes the format.
 //
 // The dictionaries of a recording are shared with it, not copied. An entry that cannot be played is
@@ -49,7 +49,7 @@ class Recording {
   const std::vector<RecordedEntry>& services() const { return services_; }
   /// Indices into `services`, ascending.
   std::span<const std::size_t> servicesOfClass(std::string_view className) const;
-  /// The first service with that entry id; null when there is none.
+  /// The first service with that entry ID; null when there is none.
   const RecordedEntry* serviceWithID(std::uint64_t entryID) const;
   const HubChannels& hubChannels() const { return hubChannels_; }
   /// Null when there are none.

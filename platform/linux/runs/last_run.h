@@ -29,7 +29,7 @@ inline constexpr std::string_view kLastRunFile = "/var/lib/tavrel/last-run.plist
 struct ProcessIdentity {
   std::int64_t process = 0;
   std::int64_t started = 0;  // ticks since boot
-  std::string boot;          // its id
+  std::string boot;          // its ID
 
   static ProcessIdentity ofThis();
   bool isRunning() const;

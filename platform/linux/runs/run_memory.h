@@ -44,7 +44,7 @@ class RunMemory final : public SystemLog {
   SystemLog& log_;
   FileSystem files_;
   LastRun run_;
-  bool isEarlierKnown_ = false;  // the data to keep from the earlier run's record
+  bool isEarlierKnown_ = false;  // the earlier run's record has been read
 };
 
 }  // namespace tavrel

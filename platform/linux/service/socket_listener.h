@@ -49,7 +49,7 @@ class SocketListener final : public ServiceListener {
   std::uint64_t lastPeerId_ = 0;
   int silentInARow_ = 0;
   bool paused_ = false;
-  bool isShort_ = false;   // of resources for a new peer at the last attempt
+  bool isShort_ = false;   // descriptors or memory were short at the last attempt
   Descriptor retryTimer_;  // made in advance, since descriptors may be short when it is needed
   LinuxEventLoop::Source retry_;
 };
