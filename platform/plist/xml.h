@@ -1,9 +1,9 @@
 // The XML encoding of property lists.
 //
 // The writer produces UTF-8 without a document-type line, with tabs, and with keys in the order of
-// their bytes, so that equal values give equal bytes (numbers are equal here when kind and value
-// are the same). The reader takes any encoding that Expat knows, with or without a document-type
-// line; it declares and expands no entity and fetches nothing.
+// their bytes, so that equal values give equal bytes (here an integer and a real of the same value
+// differ). The reader takes any encoding that Expat knows, with or without a document-type line; it
+// declares and expands no entity and fetches nothing.
 //
 //   const auto document = plist::readXml(bytes);
 //   if (!document) log(document.error().message);  // "XML property list, line 3, column 7: ..."

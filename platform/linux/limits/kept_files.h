@@ -3,7 +3,7 @@
 // No file is removed for its age, since the clock may be wrong: a device without a battery begins
 // in 1970, and a mistyped date may be years ahead. What counts is how many days have files, and how
 // many bytes they take. When there are too many, files dated after tomorrow go first, then the
-// oldest; so a clock that was ahead for a while costs only the files of that time.
+// oldest; so a clock that was wrong for a while costs only the files of that time.
 #pragma once
 
 #include <cstdint>

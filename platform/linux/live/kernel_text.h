@@ -21,7 +21,7 @@ struct Scale {
   std::int64_t divide = 1;
 };
 
-/// A number in decimal or, with 0x, hexadecimal; surrounding blanks and decimals are ignored.
+/// A number in decimal or, with 0x, hexadecimal; surrounding blanks and decimal places are ignored.
 /// Nothing for other text. Numbers that do not fit 64 signed bits become the largest one.
 std::optional<std::int64_t> parseNumber(std::string_view text);
 

@@ -27,8 +27,8 @@ struct RemovedLogs {
 };
 
 /// Deletes all logs in the folders, leftover metadata and files still being written. Links are
-/// deleted, not their targets. Each log goes before its metadata. A log that cannot be deleted does
-/// not save others; the first failure is reported.
+/// deleted, not their targets. Each log goes before its metadata. When a log cannot be deleted, the
+/// others still are; the first failure is reported.
 RemovedLogs removeLogsIn(FileSystem& files, const std::vector<std::string>& folders);
 
 /// Deletes all but the newest `count` logs of a folder, by the stamps in their names. The log named

@@ -94,9 +94,9 @@ class SegmentReader {
   /// claims.
   std::size_t positionBytes() const;
 
-  /// Passes the values after `position` to `sink`, and advances it. `writerIsGone` (see
-  /// `segment_writer.h`) must have been true before the call: then records after an unfinished one
-  /// are read too.
+  /// Passes the values after `position` to `sink`, and advances it. `writerIsGone` is what
+  /// `segment_writer.h` found before the call: if true, records after an unfinished one are read
+  /// too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                        SegmentSink& sink);
 

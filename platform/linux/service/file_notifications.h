@@ -6,9 +6,9 @@
 //
 //   inotifywait -e moved_to /run/tavrel/notifications
 //
-// Posters take turns by locking ".lock" in the folder. When a counter cannot be parsed, the next
-// post logs that and replaces it with the microseconds since 1970, a number that no waiting process
-// has seen.
+// Posters take turns by locking ".lock" in the folder. When a counter cannot be read, the next post
+// logs that and replaces it with the microseconds since 1970, a number that no waiting process has
+// seen.
 #pragma once
 
 #include <chrono>

@@ -47,7 +47,7 @@ std::optional<std::int64_t> valuesIn(std::span<const ChunkRun> runs);
 
 /// The index of the first run to join with all after it, so that many small commits do not leave a
 /// distribution in pieces; `runs.size()` for none. Joins only runs of fewer than 1,024 values, at
-/// most 64 of them. With commits of equal size, each value is rewritten twice.
+/// most 64 of them. With commits of equal size, each value is joined twice.
 std::size_t firstToJoin(std::span<const ChunkRun> runs);
 
 /// In schema version 1 a distribution had a series: chunks numbered from `series * 1048576` upward,
