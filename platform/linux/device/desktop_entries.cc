@@ -1,21 +1,21 @@
 #include "platform/linux/device/desktop_entries.h"
 
 #include <algorithm>
-#include <filesystem>
+#include <cerrno>
+#include <cstring>
 #include <string>
 #include <string_view>
-#include <system_error>
+#include <sys/stat.h>
 #include <unordered_set>
 #include <vector>
 
 #include "base/keyed_hash.h"
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/line_reader.h"
 
 namespace tavrel {
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr std::string_view kApplicationsFolder = "/applications";
 
@@ -26,10 +26,10 @@ struct DataFolder {
 
 // A user may replace a folder with a symbolic link, which may lead anywhere.
 bool hasLink(std::string folder) {
-  std::error_code ignored;
   for (const char* const name : {"/.local", "/share", "/applications"}) {
     folder += name;
-    if (fs::is_symlink(folder, ignored)) return true;
+    struct stat status {};
+    if (lstat(folder.c_str(), &status) == 0 && S_ISLNK(status.st_mode)) return true;
   }
   return false;
 }
@@ -39,11 +39,11 @@ std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
   const auto addHome = [&](const std::string& home) {
     if (!hasLink(home)) folders.push_back({home + "/.local/share", PWUserApplicationType});
   };
-  std::error_code error;
-  for (fs::directory_iterator at(root.path("/home"), error), end; !error && at != end;
-       at.increment(error)) {
-    addHome(at->path().string());
-  }
+  const std::string homes = root.path("/home");
+  walkFolder(homes, [&](const dirent& entry) {
+    addHome(homes + '/' + entry.d_name);
+    return true;
+  });
   std::sort(folders.begin(), folders.end(),
             [](const DataFolder& a, const DataFolder& b) { return a.path < b.path; });
   addHome(root.path("/root"));
@@ -73,40 +73,74 @@ bool isApplication(const std::string& path) {
   return application && lines.errorNumber() == 0;
 }
 
+bool isFolder(const std::string& path, const dirent& entry) {
+  if (entry.d_type != DT_UNKNOWN) return entry.d_type == DT_DIR;
+  struct stat status {};
+  return lstat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+}
+
+class Enumeration {
+ public:
+  Enumeration(SystemLog& log, const std::function<void(const PWBundleProxy&)>& handler)
+      : log_(log), handler_(handler) {}
+
+  bool isFull() const { return isFull_; }
+
+  /// The error number of what ended it early, except for folders that may not be read.
+  int visit(const std::string& folder, const std::string& prefix, std::string_view bundleType) {
+    int inner = 0;
+    const int code = walkFolder(folder, [&](const dirent& entry) {
+      const std::string path = folder + '/' + entry.d_name;
+      if (++visited_ > limits::kDesktopFiles) {
+        log_.log(
+            LogLevel::Error,
+            "more than %zu files and folders among desktop entries; those from %s on do not count",
+            limits::kDesktopFiles, path);
+        isFull_ = true;
+      } else if (path.ends_with(".desktop")) {
+        take(path, prefix + entry.d_name, bundleType);
+      }
+      if (!isFull_ && isFolder(path, entry)) {
+        inner = visit(path, prefix + entry.d_name + '-', bundleType);
+      }
+      return !isFull_ && inner == 0;
+    });
+    if (code == EACCES) return 0;
+    return code != 0 ? code : inner;
+  }
+
+ private:
+  void take(const std::string& path, std::string identifier, std::string_view bundleType) {
+    if (seen_.contains(identifier)) return;
+    if (seen_.size() == limits::kDesktopEntries) {
+      log_.log(LogLevel::Error, "more than %zu desktop entries; those from %s on do not count",
+               limits::kDesktopEntries, path);
+      isFull_ = true;
+      return;
+    }
+    seen_.insert(identifier);
+    if (isApplication(path)) handler_({std::move(identifier), bundleType});
+  }
+
+  SystemLog& log_;
+  const std::function<void(const PWBundleProxy&)>& handler_;
+  std::unordered_set<std::string, KeyedHash> seen_;
+  std::size_t visited_ = 0;
+  bool isFull_ = false;
+};
+
 }  // namespace
 
 void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
                              const std::function<void(const PWBundleProxy&)>& handler) {
-  std::unordered_set<std::string, KeyedHash> seen;
-  std::size_t visited = 0;
+  Enumeration enumeration(log, handler);
   for (const DataFolder& folder : dataFolders(root)) {
     const std::string top = folder.path + std::string(kApplicationsFolder);
-    std::error_code error;
-    fs::recursive_directory_iterator at(top, fs::directory_options::skip_permission_denied, error);
-    for (; !error && at != fs::recursive_directory_iterator(); at.increment(error)) {
-      const std::string path = at->path().string();
-      if (++visited > limits::kDesktopFiles) {
-        log.log(
-            LogLevel::Error,
-            "more than %zu files and folders among desktop entries; those from %s on do not count",
-            limits::kDesktopFiles, path);
-        return;
-      }
-      if (!path.ends_with(".desktop")) continue;
-      std::string identifier = path.substr(top.size() + 1);
-      std::replace(identifier.begin(), identifier.end(), '/', '-');
-      if (seen.contains(identifier)) continue;
-      if (seen.size() == limits::kDesktopEntries) {
-        log.log(LogLevel::Error, "more than %zu desktop entries; those from %s on do not count",
-                limits::kDesktopEntries, path);
-        return;
-      }
-      seen.insert(identifier);
-      if (isApplication(path)) handler({std::move(identifier), folder.bundleType});
-    }
-    if (error && error != std::errc::no_such_file_or_directory &&
-        error != std::errc::not_a_directory) {
-      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, error.message());
+    const int code = enumeration.visit(top, "", folder.bundleType);
+    if (enumeration.isFull()) return;
+    if (code != 0 && code != ENOENT && code != ENOTDIR) {
+      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top,
+              std::strerror(code));
     }
   }
 }

@@ -10,6 +10,7 @@
 #include <time.h>
 
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/system_error.h"
 
@@ -149,16 +150,11 @@ Expected<std::string> FileSystem::read(const std::string& path, std::size_t larg
 
 Expected<std::vector<std::string>> FileSystem::list(const std::string& folder) {
   std::vector<std::string> names;
-  const Folder open(opendir(folder.c_str()));
-  if (!open) {
-    if (errno == ENOENT) return names;
-    return systemError("list", folder);
-  }
-  errno = 0;
-  while (const dirent* entry = readdir(open.get())) {
-    if (entry->d_name[0] != '.') names.emplace_back(entry->d_name);
-  }
-  if (errno != 0) return systemError("list", folder);
+  const int code = walkFolder(folder, [&names](const dirent& entry) {
+    if (entry.d_name[0] != '.') names.emplace_back(entry.d_name);
+    return true;
+  });
+  if (code != 0 && code != ENOENT) return systemError("list", folder, code);
   std::sort(names.begin(), names.end());
   return names;
 }

@@ -2,14 +2,15 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <filesystem>
 #include <initializer_list>
 #include <string_view>
-#include <system_error>
+#include <sys/stat.h>
 #include <utility>
 
 #include "base/limits.h"
 #include "base/text.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/line_reader.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/locale/language_matching.h"
@@ -135,11 +136,12 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
   readLines(kGeneratedLocalesFile, [&](std::string_view line) {
     generated.emplace_back(line.substr(0, line.find_first_of(" \t\r")));
   });
-  std::error_code error;
-  std::filesystem::directory_iterator at(root_.path(kGeneratedLocalesFolder), error);
-  for (; !error && at != std::filesystem::directory_iterator(); at.increment(error)) {
-    if (at->is_directory(error)) generated.push_back(at->path().filename().string());
-  }
+  const std::string folder = root_.path(kGeneratedLocalesFolder);
+  walkFolder(folder, [&](const dirent& entry) {
+    const auto status = FileSystem::status(folder + '/' + entry.d_name);
+    if (status && S_ISDIR(status->st_mode)) generated.emplace_back(entry.d_name);
+    return true;
+  });
   std::sort(generated.begin(), generated.end());
   LanguageList languages;
   languages.add(std::string(kUntranslated));
