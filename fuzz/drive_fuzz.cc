@@ -106,7 +106,9 @@ void readMachine(fuzz::Input& input, unsigned without) {
     const std::string_view path = kAttributes[input.byte() % std::size(kAttributes)];
     tree.write(path, input.part());
   }
-  for (const Drive& drive : findDrives(Machine(tree.root))) {
+  const auto drives = findDrives(Machine(tree.root));
+  require(static_cast<bool>(drives));
+  for (const Drive& drive : *drives) {
     for (const std::string& label : {drive.model, drive.firmware, drive.serial}) {
       require(label.size() <= 64);
       for (const char c : label)

@@ -180,6 +180,11 @@ TEST(HealthTest, Growth) {
         {"a", 2, 4, 0, {{"ecc_failures", 0}}},
         {"a", 2, 9, 0, {{"ecc_failures", 0}}},
         {"a", 3, 11, 0, {{"written", 2}, {"ecc_failures", 0}}}}},
+      {"in an unknown boot only the drive's counters grow",
+       {{"a", 1, 10, 5, {}},
+        {"a", 2, 12, 7, {{"written", 2}, {"ecc_failures", 2}}},
+        {"", 2, 13, 8, {{"written", 3}}},
+        {"a", 2, 13, 9, {{"written", 3}, {"ecc_failures", 4}}}}},
       {"growth saturates",
        {{"a", 1, 0, kMost, {}},
         {"b", 2, kMost, kMost, {{"written", kMost}, {"ecc_failures", kMost}}},
@@ -355,6 +360,34 @@ TEST_F(HealthReaderTest, AKilledReaderTellsNoGrowthTwice) {
   EXPECT_TRUE(readings()["nvme1"].growth.empty()) << "it could not be remembered";
   ASSERT_TRUE(readAll(6000));
   EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 3 * 512'000);
+}
+
+TEST_F(HealthReaderTest, KeepsReadingsAndGrowthThroughFailures) {
+  addNvme("nvme0", "S1");
+  run(1);
+  ASSERT_TRUE(readAll(1000));
+  run(2);
+  put(*answers.smart, 48, {3});
+  const std::string state =
+      root.path("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist");
+  std::filesystem::rename(state, state + ".aside");
+  std::filesystem::create_directory(state);
+  EXPECT_FALSE(readAll(2000));
+  EXPECT_EQ(readings()["nvme0"].time, 2000);
+  EXPECT_TRUE(readings()["nvme0"].growth.empty());
+  std::filesystem::remove(state);
+  std::filesystem::rename(state + ".aside", state);
+
+  write("/sys/class/mtd", "no folder");
+  EXPECT_FALSE(readAll(3000));
+  EXPECT_EQ(readings()["nvme0"].time, 2000);
+  EXPECT_EQ(log.lines, (Lines{"readings have no growth: cannot use " + state +
+                                  ": it is a folder; move it away",
+                              "cannot look for drives: cannot list " + root.path("/sys/class/mtd") +
+                                  ": Not a directory"}));
+  std::filesystem::remove(root.path("/sys/class/mtd"));
+  ASSERT_TRUE(readAll(4000));
+  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000);
 }
 
 TEST(HealthTest, Verdicts) {

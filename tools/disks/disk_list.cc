@@ -15,7 +15,9 @@ DiskList findDisks(ToolContext& context) {
   auto [readings, faults] = loadReadings(context.root(), context.linuxPlatform().fileSystem());
   const std::int64_t now = saturatingInt64(context.platform().clock->now().secondsSince1970());
   const std::string boot = bootIDOf(context.root());
-  for (const Drive& drive : findDrives(Machine(context.root()))) {
+  const auto drives = findDrives(Machine(context.root()));
+  if (!drives) faults.push_back(drives.error());
+  for (const Drive& drive : drives ? *drives : std::vector<Drive>()) {
     const bool isRead = std::ranges::any_of(
         readings, [&](const Reading& reading) { return reading.name == drive.name; });
     if (isRead) continue;

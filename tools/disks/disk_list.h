@@ -19,7 +19,7 @@ struct Disk {
 
 struct DiskList {
   std::vector<Disk> disks;    // by kind
-  std::vector<Error> faults;  // of files that are not readings
+  std::vector<Error> faults;  // of files that are not readings, and of the search for drives
 };
 
 /// Every drive of the machine, and those that only have a reading.

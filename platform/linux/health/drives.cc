@@ -20,7 +20,9 @@ std::optional<std::int64_t> bytesOfSectors(std::optional<std::int64_t> sectors) 
 // The namespaces of a controller are "nvme0n1" below it, or "nvme0c0n1" with several paths.
 std::optional<std::int64_t> nvmeCapacity(const std::string& folder, const std::string& name) {
   std::optional<std::int64_t> total;
-  for (const std::string& entry : namesIn(folder)) {
+  const auto entries = namesIn(folder);
+  if (!entries) return total;
+  for (const std::string& entry : *entries) {
     if (!entry.starts_with(name)) continue;
     const auto bytes = bytesOfSectors(readNumber(folder + '/' + entry + "/size"));
     std::int64_t sum = 0;
@@ -29,19 +31,24 @@ std::optional<std::int64_t> nvmeCapacity(const std::string& folder, const std::s
   return total;
 }
 
-void addNvme(const Machine& machine, std::vector<Drive>& drives) {
+Status addNvme(const Machine& machine, std::vector<Drive>& drives) {
   const std::string classFolder = machine.sys + "/class/nvme/";
-  for (const std::string& name : namesIn(classFolder)) {
+  const auto names = namesIn(classFolder);
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
     const std::string folder = classFolder + name;
     if (!isNumbered(name, "nvme")) continue;
     drives.push_back({name, DriveKind::Nvme, folder, machine.dev + '/' + name,
                       readLabel(folder + "/model"), readLabel(folder + "/firmware_rev"),
                       readLabel(folder + "/serial"), nvmeCapacity(folder, name)});
   }
+  return Done{};
 }
 
-void addEmmc(const Machine& machine, std::vector<Drive>& drives) {
-  for (const std::string& name : namesIn(machine.sys + "/block")) {
+Status addEmmc(const Machine& machine, std::vector<Drive>& drives) {
+  const auto names = namesIn(machine.sys + "/block");
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
     const std::string block = machine.sys + "/block/" + name;
     const std::string folder = block + "/device";
     if (!isNumbered(name, "mmcblk") || readLabel(folder + "/type") != "MMC") continue;
@@ -49,6 +56,7 @@ void addEmmc(const Machine& machine, std::vector<Drive>& drives) {
                       readLabel(folder + "/name"), readLabel(folder + "/fwrev"),
                       readLabel(folder + "/serial"), bytesOfSectors(readNumber(block + "/size"))});
   }
+  return Done{};
 }
 
 // A UFS device shows logical units as SCSI disks; its health is in a folder of the controller.
@@ -61,10 +69,12 @@ std::string ufsController(const std::string& device) {
   return {};
 }
 
-void addScsi(const Machine& machine, std::vector<Drive>& drives) {
+Status addScsi(const Machine& machine, std::vector<Drive>& drives) {
   std::vector<Drive> ata;
   std::set<std::string> controllers;
-  for (const std::string& name : namesIn(machine.sys + "/block")) {
+  const auto names = namesIn(machine.sys + "/block");
+  if (!names) return names.error();
+  for (const std::string& name : *names) {
     if (!name.starts_with("sd")) continue;
     const std::string block = machine.sys + "/block/" + name;
     const std::string device = block + "/device";
@@ -91,10 +101,13 @@ void addScsi(const Machine& machine, std::vector<Drive>& drives) {
                       {}});
   }
   drives.insert(drives.end(), ata.begin(), ata.end());
+  return Done{};
 }
 
-void addRawFlash(const Machine& machine, std::vector<Drive>& drives) {
-  for (const std::string& name : namesIn(machine.sys + "/class/mtd")) {
+Status addRawFlash(const Machine& machine, std::vector<Drive>& drives) {
+  const auto partitions = namesIn(machine.sys + "/class/mtd");
+  if (!partitions) return partitions.error();
+  for (const std::string& name : *partitions) {
     const std::string folder = machine.sys + "/class/mtd/" + name;
     if (!isNumbered(name, "mtd")) continue;
     drives.push_back({name,
@@ -106,7 +119,9 @@ void addRawFlash(const Machine& machine, std::vector<Drive>& drives) {
                       {},
                       readNumber(folder + "/size")});
   }
-  for (const std::string& name : namesIn(machine.sys + "/class/ubi")) {
+  const auto volumes = namesIn(machine.sys + "/class/ubi");
+  if (!volumes) return volumes.error();
+  for (const std::string& name : *volumes) {
     const std::string folder = machine.sys + "/class/ubi/" + name;
     if (!isNumbered(name, "ubi")) continue;
     const auto blocks = readNumber(folder + "/total_eraseblocks");
@@ -123,6 +138,7 @@ void addRawFlash(const Machine& machine, std::vector<Drive>& drives) {
                       {},
                       isKnown ? std::optional(bytes) : std::nullopt});
   }
+  return Done{};
 }
 
 }  // namespace
@@ -134,12 +150,11 @@ Machine::Machine(const DeviceRoot& root) {
   dev = isRecorded ? root.path("/dev") : "/dev";
 }
 
-std::vector<Drive> findDrives(const Machine& machine) {
+Expected<std::vector<Drive>> findDrives(const Machine& machine) {
   std::vector<Drive> drives;
-  addNvme(machine, drives);
-  addEmmc(machine, drives);
-  addScsi(machine, drives);
-  addRawFlash(machine, drives);
+  for (const auto add : {addNvme, addEmmc, addScsi, addRawFlash}) {
+    if (Status done = add(machine, drives); !done) return done.error();
+  }
   return drives;
 }
 

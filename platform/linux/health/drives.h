@@ -6,6 +6,7 @@
 #include <string>
 #include <vector>
 
+#include "base/expected.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/health/figure.h"
 
@@ -30,8 +31,8 @@ struct Drive {
   std::optional<std::int64_t> capacity;  // bytes
 };
 
-/// By kind and number.
-std::vector<Drive> findDrives(const Machine& machine);
+/// By kind and number. An error when a folder of sysfs cannot be listed.
+Expected<std::vector<Drive>> findDrives(const Machine& machine);
 
 /// The ID of this boot; empty when it cannot be read.
 std::string bootIDOf(const DeviceRoot& root);

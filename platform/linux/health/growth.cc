@@ -49,10 +49,12 @@ Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& mo
     memory.lost.clear();
     memory.isCounting = !memory.last.empty();
   }
-  const bool isSameBoot = !moment.boot.empty() && memory.boot == moment.boot;
+  const bool isSameBoot = memory.boot == moment.boot;
   Figures growth;
   for (const Figure& figure : figures) {
     if (figure.kind->course == Course::Gauge) continue;
+    // Whether it began at 0 since the last reading is not known. The next one sees all it counted.
+    if (figure.kind->course == Course::Attached && moment.boot.empty()) continue;
     const std::string name(figure.kind->name);
     const auto last = memory.last.find(name);
     const auto grownBy =
@@ -66,7 +68,7 @@ Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& mo
     }
     if (!memory.lost.contains(name)) growth.push_back({figure.kind, grown});
   }
-  memory.boot = moment.boot;
+  if (!moment.boot.empty()) memory.boot = moment.boot;
   memory.seen = moment.seconds;
   if (moment.runDay) memory.runDay = moment.runDay;
   return growth;

@@ -127,15 +127,17 @@ Memory HealthReader::loadMemory() {
 
 // Growth counts from the reading that the last daily run saw, so it restarts when the daemon's last
 // run day changes.
-std::optional<std::int64_t> HealthReader::lastRunDay() {
+Expected<std::optional<std::int64_t>> HealthReader::lastRunDay() {
   const std::string path =
       root_.path(format("/var/mobile/Library/Preferences/%s.plist", kTavrelDomain));
   const auto content = files_.readIfPresent(path, limits::kPreferenceFileBytes);
-  if (!content || !*content) return std::nullopt;
+  if (!content) return content.error();
+  std::optional<std::int64_t> day;
+  if (!*content) return day;
   const auto state = plist::read(asBytes(**content));
-  if (!state) return std::nullopt;
-  const auto day = state->dictionary().number(kLastRunDayKey);
-  return day ? std::optional(day->int64()) : std::nullopt;
+  const auto number = state ? state->dictionary().number(kLastRunDayKey) : std::nullopt;
+  if (number) day = number->int64();
+  return day;
 }
 
 bool HealthReader::write(const Reading& reading) {
@@ -158,7 +160,10 @@ bool HealthReader::keep(const Memory& memory) {
 bool HealthReader::removeGone(const std::vector<Drive>& drives) {
   const std::string folder = root_.path(kReadingsFolder);
   const auto names = files_.list(folder);
-  if (!names) return false;
+  if (!names) {
+    log_.log(LogLevel::Error, "%s", names.error().message);
+    return false;
+  }
   for (const std::string& name : *names) {
     const bool isThere = std::ranges::any_of(
         drives, [&](const Drive& drive) { return drive.name + ".plist" == name; });
@@ -168,11 +173,19 @@ bool HealthReader::removeGone(const std::vector<Drive>& drives) {
 }
 
 bool HealthReader::readAll(std::int64_t nowSeconds) {
-  const std::vector<Drive> drives = findDrives(Machine(root_));
-  const Moment moment{nowSeconds, bootIDOf(root_), lastRunDay()};
+  const auto drives = findDrives(Machine(root_));
+  if (!drives) {
+    log_.log(LogLevel::Error, "cannot look for drives: %s", drives.error().message);
+    return false;
+  }
+  const auto runDay = lastRunDay();
+  if (!runDay) {
+    log_.log(LogLevel::Error, "readings have no growth: %s", runDay.error().message);
+  }
+  const Moment moment{nowSeconds, bootIDOf(root_), runDay ? *runDay : std::nullopt};
   Memory memory = loadMemory();
-  bool isDone = true;
-  for (const Drive& drive : drives) {
+  bool isDone = static_cast<bool>(runDay);
+  for (const Drive& drive : *drives) {
     bool isDriveAsleep = false;
     Reading reading = readDrive(drive, memory, isDriveAsleep);
     if (isDriveAsleep) continue;
@@ -180,7 +193,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
     reading.boot = moment.boot;
     if (!reading.error.empty()) {
       log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
-    } else {
+    } else if (runDay) {
       reading.growth = takeGrowth(memory.drives[identityOf(drive)], reading.figures, moment);
       // Store the memory before anybody sees the growth, or the next run would count it again: the
       // next drive may never answer.
@@ -193,7 +206,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   }
   // Last, because a drive that was just read is not old, whatever the clock showed before.
   if (memory.forgetOld(moment.seconds)) isDone = keep(memory) && isDone;
-  return removeGone(drives) && isDone;
+  return removeGone(*drives) && isDone;
 }
 
 }  // namespace tavrel::health

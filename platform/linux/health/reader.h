@@ -27,14 +27,14 @@ class HealthReader {
   HealthReader(const DeviceRoot& root, FileSystem& files, DeviceCommands& commands, SystemLog& log)
       : root_(root), files_(files), commands_(commands), log_(log) {}
 
-  /// False when a reading or the memory could not be written. A sleeping drive keeps its earlier
-  /// reading, the reading of a drive that has gone is removed, and the reading of a drive that
-  /// cannot be read says why.
+  /// False when drives could not be listed, or a reading or the memory could not be written. A
+  /// sleeping drive keeps its earlier reading, the reading of a drive that has gone is removed, and
+  /// the reading of a drive that cannot be read says why.
   bool readAll(std::int64_t nowSeconds);
 
  private:
   Memory loadMemory();
-  std::optional<std::int64_t> lastRunDay();
+  Expected<std::optional<std::int64_t>> lastRunDay();
   Reading readDrive(const Drive& drive, Memory& memory, bool& isAsleep);
   void readNvme(const Drive& drive, Memory& memory, Reading& reading);
   bool write(const Reading& reading);

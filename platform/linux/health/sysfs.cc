@@ -4,13 +4,12 @@
 #include <array>
 #include <cstdlib>
 #include <fcntl.h>
-#include <filesystem>
 #include <memory>
 #include <sys/stat.h>
-#include <system_error>
 
 #include "base/parse_number.h"
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/files/line_reader.h"
 
 namespace tavrel::health {
@@ -52,15 +51,10 @@ std::string readLabel(const std::string& path) {
   return label;
 }
 
-std::vector<std::string> namesIn(const std::string& folder) {
-  std::vector<std::string> names;
-  std::error_code fault;
-  for (std::filesystem::directory_iterator at(folder, fault), end; !fault && at != end;
-       at.increment(fault))
-    names.push_back(at->path().filename());
-  std::ranges::sort(names, [](const std::string& a, const std::string& b) {
-    return a.size() != b.size() ? a.size() < b.size() : a < b;
-  });
+Expected<std::vector<std::string>> namesIn(const std::string& folder) {
+  auto names = FileSystem().list(folder);
+  if (!names) return names.error();
+  std::ranges::stable_sort(*names, {}, &std::string::size);
   return names;
 }
 

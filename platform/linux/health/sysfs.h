@@ -7,6 +7,8 @@
 #include <string_view>
 #include <vector>
 
+#include "base/expected.h"
+
 namespace tavrel::health {
 
 /// The text of an attribute without leading and trailing blanks; nothing when it is missing, cannot
@@ -21,7 +23,7 @@ std::optional<std::int64_t> readNumber(const std::string& path);
 std::string readLabel(const std::string& path);
 
 /// Names in a folder, in numeric order ("nvme2" before "nvme10"); none for a missing folder.
-std::vector<std::string> namesIn(const std::string& folder);
+Expected<std::vector<std::string>> namesIn(const std::string& folder);
 
 /// Whether `name` is `prefix` followed by digits only.
 bool isNumbered(std::string_view name, std::string_view prefix);
