@@ -13,6 +13,9 @@ MOMENT = re.compile(r"<date>.*Z</date>")
 NOT_IN_THE_LOG = re.compile("Z (error (statistics store|cannot finish the daily log|cannot file log|"
                             "cannot read|Couldn't load whitelist|Failed to write)|"
                             "default Couldn't allocate histCounts)")
+NEVER_CAME = re.compile("never received requested AAI|out of memory|terminate called")
+SUMS = ["cpu.busy_milliseconds", "disk.read_kib", "disk.written_kib", "network.received_kib",
+        "network.sent_kib"]
 NAMED = re.compile(r' distribution "([^"]*)"|histCounts for key (\S+)\. ')
 
 
@@ -23,11 +26,14 @@ def values(root):
 
 
 def logs(root):
-    """What the submitted logs hold, without the moment at which they were made."""
+    """What the submitted logs hold of the day."""
     found = []
     for path in sorted((root / PENDING).glob("log-tallied-*.log")):
         log = plistlib.loads(path.read_bytes())
-        del log["BHLogCreationDate"]
+        # Of the moment, of what clients of that run delivered, and of what an earlier run applied.
+        for key in ("BHLogCreationDate", "BHActivatedAppInfo", "BHTaskID", "BHTaskDigest",
+                    "BHTasking"):
+            log.pop(key, None)
         if not path.with_suffix(".metadata.plist").exists():
             raise Broken(f"{path.name} has no metadata")
         found.append(log)
@@ -122,20 +128,105 @@ def filed(root):
     return {path.name: path.read_bytes() for path in folder.rglob("log-*")}
 
 
-def after_import(device, reference, done):
-    """All of a file, or nothing."""
-    said(done)
-    now, all_of_it = values(device), wanted(values, reference)
-    nothing = "\n".join(line for line in all_of_it.splitlines() if ".import." not in line)
-    if now != all_of_it and (done.returncode == 0 or now != nothing):
-        raise Broken(f"it ends with {done.returncode}, and there is: {now}")
+def after_change(look):
+    """All of a change is made, or nothing of it."""
+    def check(device, reference, done):
+        said(done)
+        now = look(device)
+        if now != wanted(look, reference) and (
+                done.returncode == 0 or now != wanted(look, done.before)):
+            raise Broken(f"it ends with {done.returncode}, and there is: {now}")
+    return check
 
 
-def after_set(device, _, done):
+def number(root):
+    return tool(root, "prefs", "get", "com.example", "number")
+
+
+def taskings(root):
+    return tool(root, "tasking", "show", "--json")
+
+
+def after_service(device, reference, done):
+    """As after a daily run. Clients are not answered: what they delivered may be missing, and a line
+    says so."""
+    has_application = any(b"com.example.app" in log.read_bytes()
+                          for log in (device / PENDING).glob("log-tallied-*.log"))
+    if not has_application and done.kind != "write" and not (
+            errors_of(done) or NEVER_CAME.search(done.stderr)):
+        raise Broken(f"the log has no applications, and nobody says why: {done.stderr}")
+    after_daily(device, reference, done)
+    if taskings(device) == wanted(taskings, reference):
+        return
+    if not errors_of(done):
+        raise Broken(f"the tasking is not applied, and nobody says why: {taskings(device)}")
+    next_daily_run(device, "-f")
+    if taskings(device) != wanted(taskings, reference):
+        raise Broken(f"a forced run does not apply the tasking: {taskings(device)}")
+
+
+def after_health(device, reference, done):
+    """What a reading has is right, and the next one has everything. Only remembered counters that
+    could not be read, which is said, leave it without growth."""
     said(done)
-    now = tool(device, "prefs", "get", "com.example", "number").strip()
-    if now not in (["5"] if done.returncode == 0 else ["4", "5"]):
-        raise Broken(f"it ends with {done.returncode}, and there is: {now}")
+    right, old = wanted(readings, reference), wanted(readings, done.before)
+    wrong = [(drive, key, value) for drive, reading in readings(device).items()
+             if reading != old.get(drive)
+             for key, value in reading.items() if key[0] and value != right[drive].get(key)]
+    if wrong:
+        raise Broken(f"a reading has {wrong}; it said: {done.stderr}")
+    again, _ = run(device, done.args_of)
+    now = readings(device)
+    if "starting again" in done.stderr:
+        now, right = ({drive: {key: value for key, value in reading.items() if key[0] != "growth"}
+                       for drive, reading in found.items()} for found in (now, right))
+    if again.returncode or now != right:
+        raise Broken(f"the next one ends with {again.returncode}: {again.stderr}; "
+                     f"readings are {now} in place of {right}")
+
+
+def readings(root):
+    """The readings of drives without their time, each figure with a key of its own."""
+    found = {}
+    for path in (root / "run/tavrel/health").glob("*.plist"):
+        reading = plistlib.loads(path.read_bytes())
+        del reading["time"]
+        found[path.name] = {(group, key): value for group in ("figures", "growth")
+                            for key, value in reading.pop(group, {}).items()}
+        found[path.name] |= {("", key): str(value).replace(str(root), "")
+                             for key, value in reading.items()}
+    return found
+
+
+def after_collect(device, reference, done):
+    """Values are right or absent; the next sample counts nothing twice."""
+    said(done)
+    now, right = collected(device), wanted(collected, reference)
+    before = wanted(collected, done.before)
+    is_whole = done.kind not in ("allocation", "open", "read")  # they are how the machine is asked
+    wrong = {key: value for key, value in now.items() if value not in (right[key], before.get(key))}
+    if wrong or done.returncode == 0 and (
+            now["samples"] != right["samples"] or is_whole and now != right):
+        raise Broken(f"it ends with {done.returncode}, and there is {now} in place of {right}")
+    again, _ = run(device, done.args_of)
+    last = collected(device)
+    if again.returncode or again.stderr or last["samples"] != now["samples"] + 1:
+        raise Broken(f"the next sample ends with {again.returncode}: {again.stderr}: {last}")
+    twice = {key for key in SUMS if last.get(key, 0) > right[key]}
+    if twice:
+        raise Broken(f"{twice} count twice: {last} in place of {right}")
+
+
+def collected(root):
+    """The samples of a machine that do not depend on the moment: values of scalars, numbers of
+    measurements."""
+    found = {}
+    for line in tool(root, "stat", "export").splitlines():
+        kind, _, key, *rest = line.split("\t")
+        name = key.removeprefix("com.norvane.usage.")
+        if name != key and name != "disk.free_mib":
+            found[name] = int(rest[0]) if kind == "scalar" else found.get(name, 0) + 1
+    return found
 
 
 def is_allowed(root):
@@ -204,5 +295,6 @@ def said(done):
     """A failure has a status and a line."""
     if done.returncode not in (0, 1, 2, 75, 78):
         raise Broken(f"it ends with {done.returncode}: {done.stderr}")
-    if done.returncode != 0 and not done.stderr.strip() and not done.can_be_silent:
+    # Standard error is written, too.
+    if done.returncode != 0 and not done.stderr.strip() and done.kind != "write":
         raise Broken(f"it ends with {done.returncode} without a word")

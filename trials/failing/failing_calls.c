@@ -5,12 +5,14 @@
  *   FAILING_AT      which call of that kind, from 1; "12+" is the twelfth and all later ones
  *   FAILING_MARK    a file that is made once a call has failed; it is empty when that was before
  *                   `main`, else it has one byte
+ *   FAILING_SKIPS_WAITS  when set, time passes at once while the program waits and nothing comes
  */
 #define _GNU_SOURCE
 #include <dirent.h>
 #include <dlfcn.h>
 #include <errno.h>
 #include <fcntl.h>
+#include <poll.h>
 #include <pthread.h>
 #include <stdarg.h>
 #include <stdatomic.h>
@@ -18,11 +20,13 @@
 #include <stdio.h>
 #include <stdlib.h>
 #include <string.h>
+#include <sys/epoll.h>
 #include <sys/file.h>
 #include <sys/mman.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/uio.h>
+#include <time.h>
 #include <unistd.h>
 
 enum Kind {
@@ -46,17 +50,22 @@ static const char* const kNames[kKinds] = {"none",   "allocation", "open",  "rea
                                            "flush",  "rename",     "map",   "truncate", "remove",
                                            "folder", "lock",       "thread"};
 
+enum { kLongestWait = 50 /* milliseconds */ };
+
 static enum Kind kind;
 static long at;
 static bool andLater;
 static const char* mark;
 static bool mainBegan;
+static bool skipsWaits;
 static atomic_long calls;
+static atomic_long skipped; /* milliseconds */
 
 __attribute__((constructor)) static void readSettings(void) {
   const char* const name = getenv("FAILING_KIND");
   const char* const number = getenv("FAILING_AT");
   mark = getenv("FAILING_MARK");
+  skipsWaits = getenv("FAILING_SKIPS_WAITS") != NULL;
   if (name == NULL || number == NULL || mark == NULL) return;
   char* end = NULL;
   at = strtol(number, &end, 10);
@@ -267,6 +276,37 @@ int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*
                    void* argument) {
   REAL(pthread_create)
   return fails(kThread, EAGAIN) ? EAGAIN : real(thread, attributes, start, argument);
+}
+
+/* All that comes is there at the start. */
+static int shortened(int timeout) {
+  return skipsWaits && timeout > kLongestWait ? kLongestWait : timeout;
+}
+static int waited(int ready, int timeout) {
+  if (ready == 0) atomic_fetch_add(&skipped, timeout - shortened(timeout));
+  return ready;
+}
+int epoll_wait(int file, struct epoll_event* events, int count, int timeout) {
+  REAL(epoll_wait)
+  return waited(real(file, events, count, shortened(timeout)), timeout);
+}
+int poll(struct pollfd* files, nfds_t count, int timeout) {
+  REAL(poll)
+  return waited(real(files, count, shortened(timeout)), timeout);
+}
+int clock_gettime(clockid_t clock, struct timespec* now) {
+  REAL(clock_gettime)
+  const int result = real(clock, now);
+  if (result == 0 && clock == CLOCK_MONOTONIC) {
+    const long passed = atomic_load(&skipped);
+    now->tv_sec += passed / 1000;
+    now->tv_nsec += passed % 1000 * 1000000;
+    if (now->tv_nsec >= 1000000000) {
+      now->tv_sec += 1;
+      now->tv_nsec -= 1000000000;
+    }
+  }
+  return result;
 }
 
 /* What libbrimhold calls so, past the functions above. */
