@@ -30,7 +30,7 @@ std::string signedText(double value) {
   return (value > 0 ? "+" : "") + shortNumber(value);
 }
 
-/// Probabilities are shown to two digits.
+/// Probabilities are rounded to two digits.
 std::string pValueText(double value) {
   if (value < 1e-300) return "0";
   const double digits = std::pow(10, 1 - std::floor(std::log10(value)));

@@ -14,7 +14,7 @@
 namespace tavrel::fleet {
 namespace {
 
-/// Names go to shells: only those that need no quoting.
+/// The names go to shells, so only those that need no quoting are printed.
 bool isPlain(std::string_view word) {
   return !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
     return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
@@ -23,7 +23,7 @@ bool isPlain(std::string_view word) {
   });
 }
 
-/// The first word of the version that names it.
+/// The first word of the version that no other version contains.
 std::optional<std::string> wordFor(const Question& question, const std::string& version) {
   std::string_view rest = version;
   while (!rest.empty()) {
@@ -32,7 +32,7 @@ std::optional<std::string> wordFor(const Question& question, const std::string& 
     try {
       if (isPlain(word) && question.readVersion(word) == version) return word;
     } catch (const std::runtime_error&) {
-      // Other versions have it, too.
+      // Other versions contain it, too.
     }
   }
   return std::nullopt;

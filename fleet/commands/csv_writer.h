@@ -12,9 +12,9 @@ class CsvWriter {
  public:
   explicit CsvWriter(std::ostream& out) : out_(out) {}
 
-  /// Texts from outside that a spreadsheet would run as a formula begin with an apostrophe.
+  /// Prefixes an apostrophe to outside text that a spreadsheet would run as a formula.
   CsvWriter& text(std::string_view value);
-  /// A title, or a text of our own.
+  /// A title, or text of our own.
   CsvWriter& title(std::string_view value);
   /// The shortest text that reads back to the same number; empty when it is not finite.
   CsvWriter& real(double value);

@@ -22,7 +22,7 @@ class FleetContext : public ToolOutput {
  public:
   explicit FleetContext(const ToolStreams& streams) : ToolOutput("tavrel-fleet", streams) {}
 
-  /// Where the tables are, as `--database` says.
+  /// Where the tables are: the value of `--database`.
   std::string& database() { return database_; }
   /// Throws EngineError, which `runFleet` turns into a failure.
   std::unique_ptr<Engine> openDatabase(OpenMode mode) { return openEngine(database_, mode); }

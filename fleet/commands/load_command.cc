@@ -15,7 +15,7 @@ struct LoadOptions {
   std::string setAside;
 };
 
-// One line of a terminal that each new text replaces.
+// A line of the terminal that each new text overwrites.
 class Progress {
  public:
   explicit Progress(FleetContext& context) : context_(context) {}

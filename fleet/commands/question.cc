@@ -71,7 +71,7 @@ bool isDigit(char c) {
   return c >= '0' && c <= '9';
 }
 
-// "4.1" is no part of "4.10" or "14.1".
+// "4.1" is not a part of "4.10" or "14.1".
 bool hasPart(std::string_view version, std::string_view part) {
   if (part.empty()) return false;
   for (std::size_t at = 0; (at = version.find(part, at)) != std::string_view::npos; ++at) {

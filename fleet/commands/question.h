@@ -1,5 +1,5 @@
-// What the commands that ask questions share: their options, the database they ask, and the forms
-// of their answers.
+// What the question commands share: their options, the database that they query, and the
+// formatting of their answers.
 #pragma once
 
 #include <cstdint>
@@ -16,7 +16,7 @@
 namespace tavrel::fleet {
 
 struct QuestionOptions {
-  std::string days;  // empty without one
+  std::string days;  // empty when not given
   std::optional<std::uint32_t> devicesAtLeast;
   bool csv = false;
 };
@@ -26,7 +26,7 @@ void addQuestionOptions(Command command, QuestionOptions& options);
 /// Adds --json and --csv, of which at most one may be given. Returns --json.
 Option addFormOptions(Command command, FleetContext& context, QuestionOptions& options);
 
-/// An argument that only the database can judge is wrong: the text for `failUsage`.
+/// An argument is wrong, but only the database could show that. The text goes to `failUsage`.
 class UsageError : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
@@ -44,8 +44,8 @@ class Question {
   const DayRange& days() const { return days_; }
 
   DayRange readDays(std::string_view text) const;
-  /// The version that the text names: whole, or by a part that no other version has. Throws
-  /// std::runtime_error, with a line for people.
+  /// The version that the text names, either in full or by a part that no other version contains.
+  /// Throws std::runtime_error with a readable line.
   std::string readVersion(std::string_view text) const;
 
  private:
@@ -61,20 +61,20 @@ void ask(FleetContext& context, const QuestionOptions& options,
 
 /// "fewer than 10 devices: nothing is shown".
 std::string tooFewText(std::size_t devicesAtLeast);
-/// A sentence on groups that are shown as one; empty without.
+/// A sentence about groups that are shown as one; empty when there are none.
 std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAtLeast);
 
-/// What a column of counts of logs without a mean says.
+/// The text for a column that counts logs without a mean.
 std::string noMeanText();
 
-/// What stands for a part in JSON and CSV: "all", "value", "not_told" or "other".
+/// The kind of a part in JSON and CSV: "all", "value", "not_told" or "other".
 const char* kindText(const PartName& name);
-/// The members "part" and "group", which is null but for values.
+/// The members "part" and "group"; the group is null unless the part is a value.
 Json partJson(const PartName& name);
-/// A number for people: "-" for what is not available.
+/// A number for people; "-" when it is not available.
 std::string figureText(double value);
 
-/// A number for JSON: what is not finite is null there.
+/// A number for JSON; null when it is not finite.
 Json realJson(double value);
 /// {"first": "2026-11-01", "last": "2026-11-07"}, with null for an open end.
 Json daysJson(const DayRange& days);

@@ -12,7 +12,7 @@ namespace {
 struct ShowOptions : QuestionOptions {
   std::string key;
   std::string by = "none";
-  std::string against;  // empty without one
+  std::string against;  // empty when not given
   bool buckets = false;
 };
 
@@ -24,13 +24,13 @@ GroupBy groupBy(const std::string& name) {
                             : GroupBy::kNone;
 }
 
-/// A whole version, then a range of days, then a part of a version.
+/// Tries a whole version first, then a range of days, then a part of a version.
 void readAgainst(const Question& question, const std::string& text, ShowRequest& request) {
   if (!question.table().number(Attribute::kOs, text)) {
     try {
       request.againstDays = question.readDays(text);
     } catch (const UsageError&) {
-      // It must be part of a version then.
+      // Then it must be part of a version.
     }
   }
   if (!request.againstDays) {

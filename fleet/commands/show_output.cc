@@ -16,7 +16,7 @@ namespace tavrel::fleet {
 
 namespace {
 
-/// What both kinds of statistics have.
+/// The figures that both kinds of statistics have.
 struct Figures {
   std::uint64_t values = 0;
   double minimum = 0;

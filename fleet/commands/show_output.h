@@ -10,7 +10,7 @@
 
 namespace tavrel::fleet {
 
-/// With `buckets`, the histograms of all parts instead of their figures.
+/// With `buckets`, prints the histograms of all parts instead of their figures.
 void printShown(FleetContext& context, const ShowAnswer& answer, bool buckets);
 Json shownJson(const ShowAnswer& answer);
 /// A row for each part.

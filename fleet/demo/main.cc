@@ -1,4 +1,4 @@
-// tavrel-fleet-demo DEVICES DAYS FOLDER: the logs of a simulated fleet, as a server receives them.
+// tavrel-fleet-demo DEVICES DAYS FOLDER: writes a simulated fleet's logs as a server receives them.
 #include <filesystem>
 #include <fstream>
 #include <iostream>

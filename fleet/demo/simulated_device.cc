@@ -37,7 +37,7 @@ const Region& regionAt(double share) {
   return kRegions.front();
 }
 
-/// The new version brings a whitelist of its own, with one more boundary for the launches.
+/// The new version has its own whitelist, with one more boundary for the launches.
 Dictionary whitelist(bool isNew) {
   const Dictionary rounded{{"sig_fig", 2}};
   const Array launches = isNew ? Array{50, 100, 150, 200, 300, 400, 800, 1600}
@@ -73,7 +73,7 @@ SimulatedDevice::SimulatedDevice(std::mt19937& random, std::int32_t firstDay, st
   platform_.locale.preferred = {region.language};
   platform_.locale.matched = {region.language};
 
-  // Three of four devices get the new version, once a third of the days is over.
+  // Three in four devices get the new version, after the first third of the days.
   const std::int32_t wait = days / 3;
   updateDay_ = share(random) < 0.75
                    ? firstDay + wait + static_cast<std::int32_t>(share(random) * (days - wait))

@@ -1,4 +1,4 @@
-// A device that exists in memory only, and reports with the daemon's own code.
+// A device that exists only in memory and reports with the daemon's own code.
 #pragma once
 
 #include <cstdint>
@@ -12,7 +12,7 @@
 namespace tavrel::fleet {
 
 inline constexpr const char* kOldVersion = "Pellio 4.1 (16Q210)";
-/// Its programs take a fifth longer to start.
+/// Programs take a fifth longer to start in this version.
 inline constexpr const char* kNewVersion = "Pellio 4.2 (16R349)";
 
 struct SimulatedLog {
@@ -23,11 +23,11 @@ struct SimulatedLog {
 
 class SimulatedDevice {
  public:
-  /// The days of the fleet are numbered from `firstDay`; on some of them devices get the new
-  /// version.
+  /// The simulation covers `days` days from `firstDay`. On one of them most devices
+  /// switch to the new version.
   SimulatedDevice(std::mt19937& random, std::int32_t firstDay, std::int32_t days);
 
-  /// Nothing on a day on which the device is off.
+  /// Nothing on a day when the device is off.
   std::optional<SimulatedLog> live(std::int32_t day);
 
  private:
@@ -41,8 +41,8 @@ class SimulatedDevice {
   LinuxDigest digest_;
   bool isNew_ = false;
   std::int32_t updateDay_ = 0;
-  double slowness_ = 1;     // beside other devices
-  double usedPercent_ = 0;  // of the flash's life, when the simulation begins
+  double slowness_ = 1;     // relative to other devices
+  double usedPercent_ = 0;  // of the flash's rated life, when the simulation begins
   double freeMebibytes_ = 0;
 };
 

@@ -1,8 +1,8 @@
-// Where the fleet's logs are kept: tables in a database, filled with records and read as rows.
+// Keeps the fleet's logs: tables in a database, filled with records and read as rows.
 //
-// An engine stores and finds; it does no floating-point arithmetic, so that what is computed from
-// its rows has the same bits on each engine. Every operation throws EngineError when the database
-// cannot do it; what was appended before stays.
+// An engine stores and finds rows. It does no floating-point arithmetic, so results computed from
+// its rows have the same bits with every engine. Every operation throws EngineError when the
+// database fails; whatever was appended before stays.
 #pragma once
 
 #include <cstddef>
@@ -25,10 +25,10 @@ class EngineError : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
-/// Names a log within one database. Not the same in another one.
+/// Identifies a log within one database; other databases number theirs differently.
 using LogId = std::uint64_t;
 
-/// Texts are valid during the call that hands the row out.
+/// Texts are valid only during the call that hands out the row.
 struct LogRow {
   LogId log = 0;
   std::int32_t day = 0;
@@ -67,7 +67,7 @@ struct Key {
   KeyKind kind = KeyKind::kScalar;
 };
 
-/// Rows come in blocks, in no particular order, each row once. What a visitor throws is passed on.
+/// Rows come in blocks, in no particular order, each once. A visitor's exceptions reach the caller.
 template <class Row>
 using Visitor = std::function<void(std::span<const Row>)>;
 
@@ -80,19 +80,19 @@ class Engine {
     std::size_t known = 0;  ///< logs that were there before, or twice among the records
   };
 
-  /// Files all records in one step: after a kill at any moment each of them is there whole or not
-  /// at all. Several loaders may append at once; a log that two of them bring counts once.
+  /// Files each record whole or not at all, even when the process is killed. Several loaders may
+  /// append at once; a log that two of them file counts once.
   virtual Appended append(std::span<const LogRecord> records) = 0;
 
   /// The logs of the days from `firstDay` to `lastDay`, both included.
   virtual void logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) = 0;
 
-  /// All keys that have rows, in the order of kind and name. A load that was killed may have left
-  /// further ones.
+  /// All keys that have rows, ordered by kind and name. Keys left by a load that was
+  /// killed may also be among them.
   virtual std::vector<Key> keys() = 0;
 
-  // The rows of one key, of all days. A key without rows has none. Rows of logs that `logs` does
-  // not hand out do not count: a load that was killed may have left some.
+  // Hand out all rows of one key, whatever their day; none for an unknown key. The caller must
+  // ignore rows of logs that `logs` does not hand out: a load that was killed may have left some.
   virtual void scalars(std::string_view key, const Visitor<ScalarValue>& visit) = 0;
   virtual void distributions(std::string_view key, const Visitor<DistributionValue>& visit) = 0;
   virtual void cells(std::string_view key, const Visitor<CellValue>& visit) = 0;

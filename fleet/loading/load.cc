@@ -13,13 +13,13 @@
 namespace tavrel::fleet {
 namespace {
 
-// What the database takes in one step. More would hold up other loaders, less costs it time; it
-// does not wait for more than the least while others still read.
+// The database takes this much in one step. More would hold up other loaders; less costs it time.
+// The least is filed at once when no further log has been read yet.
 constexpr std::size_t kBatchLogs = 1'000;
 constexpr std::size_t kLeastBatchLogs = 256;
 constexpr std::size_t kBatchBytes = 64U << 20;
 
-// One thread, which has the most to do, files what the others read.
+// One thread, the busiest, files what the others read.
 unsigned readers() {
   return std::max(2U, std::thread::hardware_concurrency()) - 1;
 }
@@ -31,7 +31,7 @@ class Loading {
     if (request.setAside) setAside_.emplace(*request.setAside);
   }
 
-  /// `isMoreRead`: another item can be had at once.
+  /// `isMoreRead`: whether another item is available without waiting.
   Status take(ReadItem item, bool isMoreRead) {
     if (item.record) {
       batch_.push_back(*std::move(item.record));

@@ -1,4 +1,4 @@
-// Files the logs of many places in the tables.
+// Loads logs from many places into the tables.
 #pragma once
 
 #include <cstddef>
@@ -15,9 +15,9 @@ namespace tavrel::fleet {
 
 struct LoadRequest {
   std::vector<std::string> paths;
-  std::vector<std::string> uploadLines;  // files with the metadata of a server's uploads
-  std::vector<std::string> whitelists;   // all keys are permitted when there are none
-  std::optional<std::string> setAside;   // folder for copies of refused logs
+  std::vector<std::string> uploadLines;  // files with the metadata that an upload server noted
+  std::vector<std::string> whitelists;   // when there are none, all keys are permitted
+  std::optional<std::string> setAside;   // the folder for copies of refused logs
 };
 
 struct LoadCounts {
@@ -28,13 +28,13 @@ struct LoadCounts {
 };
 
 struct LoadListener {
-  /// Lines about what was refused and skipped, in the order in which it was found.
+  /// Takes lines about refused and skipped files, in the order in which these were found.
   std::function<void(std::string_view line)> note;
   std::function<void(const LoadCounts& counts)> progress;
 };
 
-/// Fails when what the request names for itself cannot be read, or a refused log cannot be set
-/// aside. Throws EngineError. What was filed before a failure stays filed.
+/// Fails when something that the request itself names cannot be read, or a refused log cannot be
+/// set aside. Throws EngineError. What was filed before a failure stays filed.
 Expected<LoadCounts> load(Engine& engine, const LoadRequest& request, const LoadListener& listener);
 
 }  // namespace tavrel::fleet

@@ -1,4 +1,4 @@
-// Which keys a log may have: those that its whitelist names.
+// Which keys a log may have: those in its whitelist.
 #pragma once
 
 #include <map>
@@ -12,15 +12,15 @@
 
 namespace tavrel::fleet {
 
-/// Whitelists by their digests, all groups of each.
+/// Whitelists by their digests, with all groups of each.
 class PermittedKeys {
  public:
   /// Reads a whitelist file.
   Status add(const std::string& path);
   bool empty() const { return whitelists_.empty(); }
 
-  /// Why the log is refused: its whitelist is not among those added, or does not name a key. Empty
-  /// when all is permitted. May be called in several threads.
+  /// Why the log is refused: its whitelist was not added, or does not name one of its keys. Empty
+  /// when the log is permitted. Safe to call in several threads.
   std::string faultOf(const LogRecord& record) const;
 
  private:

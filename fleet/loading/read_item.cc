@@ -18,7 +18,7 @@ void refuse(ReadItem& item, std::string reason) {
   item.source.reason = std::move(reason);
 }
 
-// False when the log is refused, or is of another kind.
+// False when the log is refused or is of another kind.
 bool takeSidecar(ReadItem& item) {
   SourceItem& source = item.source;
   if (!source.hasSidecar) return true;

@@ -1,4 +1,4 @@
-// From what was found to a record, or to why there is none.
+// Turns what was found into a record, or into the reason why there is none.
 #pragma once
 
 #include <optional>
@@ -11,13 +11,13 @@
 namespace tavrel::fleet {
 
 struct ReadItem {
-  /// `kFile` and `kContent` when it was read; a refused item keeps its path or content.
+  /// `kFile` or `kContent` after a successful read; a refused item keeps its path or content.
   SourceItem source;
   std::optional<LogRecord> record;
   std::size_t bytes = 0;  // of the document that was read
 };
 
-/// `permitted` may be without whitelists, and then permits everything.
+/// Without whitelists, `permitted` permits everything.
 ReadItem readItem(SourceItem item, LogReader& reader, const PermittedKeys& permitted);
 
 }  // namespace tavrel::fleet

@@ -8,9 +8,9 @@ namespace {
 constexpr std::size_t kPieceItems = 8;
 constexpr std::size_t kPieceBytes = 1U << 20;
 
-// What may be found and read ahead of the database: pieces, and bytes of logs, whose records take
-// about as much memory. Enough for the time in which the database takes a batch; memory that is
-// used again costs less than more of it.
+// How far the search and the readers may run ahead of the database: in pieces, and in bytes of
+// logs, whose records take about as much memory. It is enough to bridge the filing of a batch;
+// reusing memory costs less than taking more.
 constexpr std::size_t kPiecesAhead = 80;
 constexpr std::size_t kBytesAhead = 192U << 20;
 
@@ -89,7 +89,7 @@ void ReadingThreads::readPieces() {
       changed_.wait(lock, [&] {
         if (stopped_ || (foundAll_ && waiting_.empty())) return true;
         if (waiting_.empty()) return false;
-        // The first one is what `next` waits for.
+        // `next` waits for the first piece, so that one is read whatever its size.
         return bytes_ < kBytesAhead || waiting_.front() == order_.front();
       });
       if (stopped_ || waiting_.empty()) return;

@@ -21,23 +21,23 @@ namespace tavrel::fleet {
 
 class ReadingThreads {
  public:
-  /// `find` runs in a thread of its own and gives what it finds to the sink. What it throws, `next`
-  /// throws.
+  /// `find` runs in a thread of its own and passes what it finds to the sink. `next`
+  /// rethrows what `find` throws.
   ReadingThreads(std::function<void(const SourceSink&)> find, const PermittedKeys& permitted,
                  unsigned threads);
   ReadingThreads(const ReadingThreads&) = delete;
   ReadingThreads& operator=(const ReadingThreads&) = delete;
-  /// Ends the search.
+  /// Stops the search.
   ~ReadingThreads();
 
-  /// Nothing at the end.
+  /// Nothing once all items have been taken.
   std::optional<ReadItem> next();
   /// Whether `next` would not wait.
   bool isMoreRead();
 
  private:
   struct Stopped {};
-  // Items that one thread reads in a row, so that threads seldom wait for each other.
+  // Items that one thread reads in a row, which makes the threads wait for each other less often.
   struct Piece {
     std::vector<SourceItem> found;
     std::vector<ReadItem> read;
@@ -54,9 +54,9 @@ class ReadingThreads {
   const PermittedKeys& permitted_;
   std::mutex mutex_;
   std::condition_variable changed_;
-  std::deque<std::shared_ptr<Piece>> order_;    // all that `next` has not taken
-  std::deque<std::shared_ptr<Piece>> waiting_;  // those of them that no thread reads yet
-  std::size_t bytes_ = 0;                       // of all in `order_`
+  std::deque<std::shared_ptr<Piece>> order_;    // everything that `next` has not taken
+  std::deque<std::shared_ptr<Piece>> waiting_;  // the part of it that no thread reads yet
+  std::size_t bytes_ = 0;                       // of everything in `order_`
   bool foundAll_ = false;
   bool stopped_ = false;
   std::exception_ptr failure_;

@@ -16,7 +16,7 @@ namespace {
 
 constexpr mode_t kMode = 0640;
 
-// A name of our own: what an archive calls its members may be anything.
+// Makes a harmless file name: an archive may name its members anything.
 std::string safeName(std::string_view name) {
   constexpr std::size_t kLongest = 150;
   constexpr std::string_view kSafe =
@@ -38,14 +38,14 @@ Status SetAside::keep(const SourceItem& refused) {
   }
   constexpr std::size_t kDigits = 16;
   std::string digest;
-  // Where it is tells one that cannot be read from others.
+  // Logs that cannot be read have no bytes; their place tells them apart.
   appendHex(digest, sha256Of(asBytes(bytes.empty() ? refused.name : bytes)));
   const std::string path =
       folder_ + '/' + digest.substr(0, kDigits) + '-' + safeName(fileNameOf(refused.name));
   if (!bytes.empty()) {
     if (Status done = files_.replace(path, asBytes(bytes), kMode); !done) return done;
   }
-  // For a terminal, too.
+  // Printable, since people may show the file on a terminal.
   const std::string reason = printable(refused.name + ": " + refused.reason) + '\n';
   return files_.replace(path + ".reason", asBytes(reason), kMode);
 }

@@ -11,12 +11,12 @@ namespace tavrel::fleet {
 
 class SetAside {
  public:
-  /// The folder is made when it is needed.
+  /// Makes the folder only when it is needed.
   explicit SetAside(std::string folder) : folder_(std::move(folder)) {}
 
-  /// Writes the bytes of a refused log as DIGITS-NAME, and where it was and the reason as
-  /// DIGITS-NAME.reason. The digits are those of the bytes' SHA-256, so that the same log has the
-  /// same name each time. Of what cannot be read only the reason is written.
+  /// Writes the bytes of a refused log to DIGITS-NAME, and its origin and the reason to
+  /// DIGITS-NAME.reason. The digits come from the SHA-256 of the bytes, so the same log always gets
+  /// the same name. For a log that cannot be read, only the reason is written.
   Status keep(const SourceItem& refused);
 
  private:

@@ -5,7 +5,7 @@
 namespace tavrel::fleet {
 namespace {
 
-// The depth of a document that has been read is bounded.
+// Recursion is safe: the reader has already bounded the depth of the document.
 bool build(LogBuilder& builder, const plist::Value& value) {
   if (const auto dictionary = value.dictionary()) {
     if (!builder.begin(true)) return false;

@@ -8,7 +8,7 @@
 
 namespace tavrel::fleet {
 
-/// Why the document is refused; empty when it was read.
+/// Returns why the document is refused; empty when it was read.
 std::string readBinaryLog(ByteSpan document, LogBuilder& builder);
 
 }  // namespace tavrel::fleet

@@ -43,7 +43,7 @@ class Reading {
  public:
   Reading(XML_Parser parser, LogBuilder& builder) : parser_(parser), builder_(builder) {}
 
-  // Nothing may be thrown through the parser, which is C: it is thrown on after the parse.
+  // No exception may pass through the parser, which is C: it is rethrown after the parse.
   template <class Action>
   void guarded(Action action) noexcept {
     if (stopped_) return;
@@ -123,8 +123,8 @@ class Reading {
 
   XML_Parser parser_;
   LogBuilder& builder_;
-  std::optional<XmlValue> value_;  // whose text is gathered
-  bool isEmpty_ = false;           // inside of <true/> or <false/>
+  std::optional<XmlValue> value_;  // the element whose text is being gathered
+  bool isEmpty_ = false;           // inside <true/> or <false/>
   bool insidePlist_ = false;
   bool stopped_ = false;
   std::string text_;
@@ -160,7 +160,7 @@ void XMLCALL onSkippedEntity(void* reading, const XML_Char*, int) {
   with(reading, [](Reading& self) { return self.stop("has an entity that is not known"); });
 }
 
-// Expat recognises them, too, and would convert them.
+// Such documents are refused here, because Expat would recognise and convert them.
 bool isUtf16(ByteSpan document) {
   const std::string_view beginning = asText(document).substr(0, 2);
   return beginning.size() == 2 && (beginning == "\xFE\xFF" || beginning == "\xFF\xFE" ||

@@ -1,4 +1,4 @@
-// A reader of XML property lists in UTF-8, by Expat. It declares and expands no entity.
+// Reads XML property lists in UTF-8 with Expat. Declares and expands no entity.
 #pragma once
 
 #include <memory>
@@ -11,10 +11,10 @@ struct XML_ParserStruct;
 
 namespace tavrel::fleet {
 
-/// One object reads one document after the other.
+/// One object reads one document after another.
 class ExpatXml {
  public:
-  /// Why the document is refused; empty when it was read.
+  /// Returns why the document is refused; empty when it was read.
   std::string read(ByteSpan document, LogBuilder& builder);
 
  private:

@@ -40,7 +40,7 @@ const char* faultOf(const FiveNumbers& n) {
     if (std::isnan(n.squaredDeviations)) {
       return "its deviations are not a number, but its mean is";
     }
-    // They are largest when each value is the minimum or the maximum. Rounding adds to that.
+    // They are largest when each value is the minimum or the maximum; rounding may add to that.
     const double most = static_cast<double>(n.count) * (n.maximum - n.mean) * (n.mean - n.minimum);
     const double size = std::max(std::abs(n.minimum), std::abs(n.maximum));
     const double margin = 1e-6 * (most + static_cast<double>(n.count) * size * size);
@@ -51,7 +51,7 @@ const char* faultOf(const FiveNumbers& n) {
     return std::isnan(n.squaredDeviations) ? nullptr
                                            : "its mean is not a number, but its deviations are";
   }
-  // An infinite mean comes of infinite values, or of a difference beyond the range of a double.
+  // An infinite mean stems from infinite values, or from a difference beyond the range of a double.
   return std::isfinite(n.maximum - n.minimum) ? "its mean is infinite, and its values are not"
                                               : nullptr;
 }

@@ -10,7 +10,7 @@
 namespace tavrel::fleet {
 namespace {
 
-constexpr int kGzipOnly = 16;  // added to the size of the window
+constexpr int kGzipOnly = 16;  // a flag that is added to the window size
 constexpr std::size_t kFirstRoom = 64U << 10;
 
 struct End {
@@ -27,7 +27,7 @@ Status gunzip(ByteSpan bytes, std::size_t limit, std::string& out) {
   z_stream stream{};
   if (inflateInit2(&stream, MAX_WBITS + kGzipOnly) != Z_OK) throw std::bad_alloc();
   const std::unique_ptr<z_stream, End> owner(&stream);
-  // zlib takes no constant input, and changes none. A log's file is far below 4 GiB.
+  // zlib's input pointer is not const, though it changes nothing. A log is far smaller than 4 GiB.
   stream.next_in = reinterpret_cast<Bytef*>(const_cast<std::byte*>(bytes.data()));
   stream.avail_in = static_cast<uInt>(bytes.size());
   std::size_t size = 0;

@@ -1,4 +1,4 @@
-// gzip's form, with a bound on what it expands to.
+// Decompresses gzip data, with a limit on its expanded size.
 #pragma once
 
 #include <cstddef>
@@ -11,8 +11,8 @@ namespace tavrel::fleet {
 
 bool isGzip(ByteSpan bytes);
 
-/// Replaces `out` with the content of all members. Fails when it is damaged, cut short or longer
-/// than `limit`.
+/// Replaces `out` with the content of all members. Fails when the data is damaged, cut short or
+/// longer than `limit` once expanded.
 Status gunzip(ByteSpan bytes, std::size_t limit, std::string& out);
 
 }  // namespace tavrel::fleet

@@ -12,7 +12,7 @@ struct Interval {
   double upper = 0;
 };
 
-/// Nothing for a text that is no such label, and for an interval that holds no value.
+/// Nothing when the text is not such a label, or when the interval holds no value.
 std::optional<Interval> parseIntervalLabel(std::string_view label);
 
 }  // namespace tavrel::fleet

@@ -12,7 +12,7 @@
 
 namespace tavrel::fleet {
 
-// Those up to `kHistograms` must be there.
+// Members up to `kHistograms` are mandatory.
 enum class LogBuilder::Member : std::uint8_t {
   kVersion,
   kStartDate,
@@ -38,7 +38,7 @@ constexpr std::size_t kRequiredMembers = 6;
 
 constexpr std::size_t kShownBytes = 100;
 
-// The beginning of a long text.
+// Shortens a long text for a message.
 std::string_view shown(std::string_view text) {
   return text.substr(0, kShownBytes);
 }
@@ -122,7 +122,7 @@ bool LogBuilder::addRow() {
   return fail(format("the log has more than %zu rows", limits::kLogRows));
 }
 
-// The place of a value in the grammar of property lists.
+// Checks that property lists allow a value here.
 bool LogBuilder::takeValue() {
   if (levels_.empty()) {
     if (hasDocument_) return fail("there is a second value");
@@ -132,7 +132,7 @@ bool LogBuilder::takeValue() {
   Level& level = levels_.back();
   if (!level.isDictionary) return true;
   if (!level.hasKey) {
-    // The last place is not that of the value.
+    // Not `fail`, which would name the place of an earlier value.
     fault_ = "a dictionary has a value without a key";
     return false;
   }
@@ -259,7 +259,7 @@ bool LogBuilder::addNumber(double number) {
   if (numberCount_ >= 4) {
     return wrongType();
   }
-  // One of the many forms of not-a-number, so that equal logs have equal bits.
+  // Not-a-number has many bit patterns; use one, so that equal logs have equal bits.
   numbers_[numberCount_++] = std::isnan(number) ? std::numeric_limits<double>::quiet_NaN() : number;
   return true;
 }

@@ -1,11 +1,11 @@
-// Makes a record of a log from the events of a property-list reader, in one pass.
+// Builds a record of a log from the events of a property-list reader, in one pass.
 //
 //   LogBuilder builder(record);
 //   builder.begin(true); builder.key("BHScalars"); ... builder.end();
 //   if (!builder.finish()) refuse(builder.fault());
 //
-// Every operation yields false when the log is refused; `fault` has the reason, and nothing else
-// may be called. Texts are copied.
+// Every operation returns false when the log is refused; then `fault` has the reason, and only it
+// may still be called. Texts are copied.
 #pragma once
 
 #include <array>
@@ -21,7 +21,7 @@ namespace tavrel::fleet {
 
 class LogBuilder {
  public:
-  /// Fills `record`, which is empty.
+  /// Fills `record`, which must be empty.
   explicit LogBuilder(LogRecord& record) : record_(record) {}
 
   bool begin(bool isDictionary);
@@ -31,13 +31,13 @@ class LogBuilder {
   bool integer(const plist::Number& number);
   bool real(double number);
   bool date(plist::Date date);
-  /// A boolean or data: no entry that is read has one.
+  /// A boolean or data, which no entry that is read may be.
   bool other();
 
-  /// After the last event.
+  /// Call it after the last event.
   bool finish();
 
-  /// Refuses the log for what is at the place that is read now.
+  /// Refuses the log, naming the place that is being read.
   bool fail(std::string_view reason);
   const std::string& fault() const { return fault_; }
 
@@ -76,10 +76,10 @@ class LogBuilder {
   LogRecord& record_;
   std::vector<Level> levels_;
   bool hasDocument_ = false;
-  std::uint32_t seen_ = 0;  // members of the root, by their numbers
+  std::uint32_t seen_ = 0;  // members of the root, a bit for each number
   Member member_{};
   std::string_view memberName_;
-  std::string_view entry_;  // of a section; in the record's texts
+  std::string_view entry_;  // of a section; points into the record's texts
   std::string_view inner_;  // the key inside an entry or an application; valid until its value
   std::array<double, 4> numbers_{};
   std::uint64_t count_ = 0;

@@ -16,7 +16,7 @@ std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
 
 void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
   if (key == "ConfigNumber") metadata.configNumber = std::move(value);
-  // The first log of a device says that there was none before.
+  // The first log of a device says here that there was no earlier version.
   else if (key == "previous_os_version" && value != kNoVersion) {
     metadata.previousOsVersion = std::move(value);
   }
@@ -29,7 +29,7 @@ int hexDigit(char digit) {
   return -1;
 }
 
-// The log's name, when the file has the form of a submitted log: -YYYYMMDDTHHMMSSZ-XXXXXXXX.log
+// The log's name, when the file is named like a submitted log: NAME-YYYYMMDDTHHMMSSZ-XXXXXXXX.log
 std::string_view logNameOf(std::string_view fileName) {
   constexpr std::string_view kForm = "-########T######Z-xxxxxxxx.log";
   if (fileName.size() <= kForm.size()) return {};

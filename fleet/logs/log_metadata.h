@@ -1,4 +1,4 @@
-// What the submission service says of a log beside it.
+// What the submission service notes about a log, beside the log itself.
 #pragma once
 
 #include <string>
@@ -10,23 +10,23 @@
 namespace tavrel::fleet {
 
 struct LogMetadata {
-  std::string logType;  // "193" of tallied logs; empty when it is not known
+  std::string logType;  // "193" for tallied logs; empty when unknown
   std::string osVersion;
   std::string previousOsVersion;
   std::string configNumber;
 };
 
-/// NAME.metadata.plist as a device writes it. What is missing, or has another type, is empty.
+/// Reads NAME.metadata.plist as a device writes it. Fields that are missing or mistyped stay empty.
 Expected<LogMetadata> readMetadataFile(ByteSpan document);
 
-/// The value of the header `Tavrel-Options`, "KEY=VALUE&KEY=VALUE" with %XX, into the fields.
+/// Reads the value of the header `Tavrel-Options`, "KEY=VALUE&KEY=VALUE" with %XX, into the fields.
 void readOptions(std::string_view options, LogMetadata& metadata);
 
-/// `%XX` as the bytes that they stand for.
+/// Replaces each `%XX` with the byte that it stands for.
 std::string percentDecoded(std::string_view text);
 
-/// Whether a log of this file name, "NAME-STAMP-DIGITS.log", is of another kind than those that are
-/// read, as its metadata says, or else its name.
+/// Whether a log named "NAME-STAMP-DIGITS.log" is of a kind that is not read, according to its
+/// metadata or, without any, its name.
 bool isOtherLog(std::string_view fileName, const LogMetadata* metadata);
 
 }  // namespace tavrel::fleet

@@ -14,12 +14,12 @@ namespace {
 
 constexpr std::string_view kBinaryBeginning = "bplist";
 
-// A document of another kind is better named than reported as malformed XML.
+// Tells documents of other kinds apart, so that they are not reported as malformed XML.
 bool looksLikeXml(std::string_view text) {
   if (text.starts_with("\xEF\xBB\xBF")) text.remove_prefix(3);
   const std::size_t first = text.find_first_not_of(" \t\n\r");
   if (first != std::string_view::npos && text[first] == '<') return true;
-  // UTF-16, with a mark of its order or without.
+  // UTF-16, with or without a byte-order mark.
   return text.starts_with("\xFE\xFF") || text.starts_with("\xFF\xFE") ||
          text.starts_with(std::string_view("\0<", 2));
 }

@@ -1,4 +1,4 @@
-// Reads submitted logs: XML or binary property lists, as they are or in gzip's form.
+// Reads submitted logs: XML or binary property lists, plain or compressed with gzip.
 //
 //   LogReader reader;
 //   auto record = reader.read(bytes, &metadata);
@@ -15,13 +15,13 @@
 
 namespace tavrel::fleet {
 
-/// One object reads one log after the other, in one thread.
+/// One object reads one log after another, in one thread.
 class LogReader {
  public:
-  /// The error is the reason for which the log is refused, on one line without the file's name.
-  /// Without metadata the versions are not known.
+  /// The error is why the log is refused: one line, without the file's name. Without metadata,
+  /// the versions are unknown.
   Expected<LogRecord> read(ByteSpan bytes, const LogMetadata* metadata);
-  /// Of the last log, expanded.
+  /// The size of the last log, expanded.
   std::size_t documentBytes() const { return documentBytes_; }
 
  private:
@@ -30,7 +30,7 @@ class LogReader {
   ExpatXml xml_;
   std::string expanded_;
   std::size_t documentBytes_ = 0;
-  // Of the last log, to make room for the next one.
+  // Row counts of the last log, to reserve as much for the next one.
   std::size_t scalars_ = 0;
   std::size_t distributions_ = 0;
   std::size_t cells_ = 0;

@@ -11,7 +11,7 @@
 namespace tavrel::fleet {
 namespace {
 
-// The characters of a text that stand for themselves.
+// Characters that stand for themselves in a text.
 constexpr std::array<bool, 256> kPlainCharacters = [] {
   std::array<bool, 256> plain{};
   for (int character = 0x20; character < 0x7F; ++character)
@@ -23,13 +23,13 @@ constexpr std::array<bool, 256> kPlainCharacters = [] {
 
 constexpr std::size_t kWordBytes = sizeof(std::uint64_t);
 
-// How many of eight characters, from the first on, are from 0x20 to 0x7E and stand for themselves.
+// How many of the next eight characters, up to the first other one, are plain ASCII.
 std::size_t plainInWord(const char* text) {
   constexpr std::uint64_t kOnes = 0x0101010101010101;
   std::uint64_t word = 0;
   std::memcpy(&word, text, sizeof word);
   if constexpr (std::endian::native == std::endian::big) word = __builtin_bswap64(word);
-  // Sets the top bit of the first byte that is less than a number, if there is one.
+  // Sets the top bit of the first byte, if any, that is less than the number.
   const auto less = [](std::uint64_t bytes, std::uint64_t number) {
     return (bytes - number * kOnes) & ~bytes;
   };
@@ -60,7 +60,7 @@ class Reader {
   }
 
  private:
-  // A literal, so that its comparison is a few instructions.
+  // A template on the literal's size, so that the comparison is only a few instructions.
   template <std::size_t kSize>
   bool take(const char (&text)[kSize]) {
     constexpr std::size_t kLength = kSize - 1;
@@ -82,7 +82,7 @@ class Reader {
     return taken;
   }
 
-  // One start tag with its text, or one end tag. False ends the reading.
+  // Reads one start tag with its text, or one end tag. False ends the reading.
   bool readElement() {
     if (rest_.size() < 2 || rest_[0] != '<') return false;
     switch (rest_[1]) {
@@ -134,7 +134,7 @@ class Reader {
     return text && take(endTag) && built(buildValue(builder_, element, *text));
   }
 
-  // Up to the next tag; nothing when it is not plain.
+  // The text up to the next tag; nothing when it is not plain.
   std::optional<std::string_view> readText() {
     std::size_t size = 0;
     while (true) {
@@ -150,7 +150,7 @@ class Reader {
     return rest_.starts_with('&') ? readReferences(text) : text;
   }
 
-  // The rest of a text that has characters of XML itself, written as references.
+  // Reads the rest of a text in which references stand for XML's own characters.
   std::optional<std::string_view> readReferences(std::string_view beginning) {
     unescaped_ = beginning;
     while (!rest_.starts_with('<')) {

@@ -1,6 +1,6 @@
-// A reader of XML property lists in the form in which devices write nearly all of them: ASCII,
-// elements without attributes, no comments. It is several times as fast as a reader of all of XML,
-// and leaves every other document to that one (fleet/logs/expat_xml.h).
+// Reads XML property lists in the form that devices nearly always write: ASCII, elements without
+// attributes, no comments. It is several times as fast as a full XML reader, to which it leaves
+// every other document (fleet/logs/expat_xml.h).
 #pragma once
 
 #include <cstdint>
@@ -11,9 +11,9 @@
 namespace tavrel::fleet {
 
 enum class PlainXml : std::uint8_t {
-  kRead,      ///< to its end, which is that of a property list
+  kRead,      ///< to its end, where the property list ends as well
   kRefused,   ///< by the builder
-  kNotPlain,  ///< the document has another form, or is no property list
+  kNotPlain,  ///< the document has another form, or is not a property list
 };
 
 PlainXml readPlainXml(std::string_view document, LogBuilder& builder);

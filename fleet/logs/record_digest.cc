@@ -1,5 +1,5 @@
-// The newer functions of libcrypto set up all of it, in allocations whose failure some of its
-// versions do not survive; these need none.
+// libcrypto's newer functions initialise all of the library, with allocations whose failure some
+// versions do not survive. The deprecated functions need none.
 #define OPENSSL_SUPPRESS_DEPRECATED
 
 #include "fleet/logs/record_digest.h"
@@ -14,8 +14,8 @@
 namespace tavrel::fleet {
 namespace {
 
-// Words are little-endian, and texts have their length before them, so that no two records have the
-// same form.
+// The bytes that are hashed. Words are little-endian, and each text is preceded by its length, so
+// that no two records have the same bytes.
 class Form {
  public:
   explicit Form(std::size_t room) { bytes_.reserve(room); }

@@ -9,8 +9,8 @@
 
 namespace tavrel::fleet {
 
-/// SHA-256 of everything in a record whose rows are in order, except for what comes from the log's
-/// metadata: the same log is known again when its metadata is lost, or found.
+/// SHA-256 of everything in a record, whose rows must be in order, except the log's metadata. A log
+/// is thus recognised even when its metadata was lost or has turned up since.
 std::array<std::byte, 32> digestOf(const LogRecord& record);
 
 /// SHA-256 of bytes.

@@ -13,7 +13,7 @@ namespace {
 
 constexpr std::size_t kShownBytes = 100;
 
-// Logs come sorted, mostly. Yields a key that is there twice.
+// Sorts rows, which mostly come sorted. Returns a row whose key occurs twice, or null.
 template <class Row>
 const Row* sortByKey(std::vector<Row>& rows) {
   const auto before = [](const Row& a, const Row& b) { return a.key < b.key; };
@@ -30,7 +30,7 @@ std::string fault(std::string_view section, std::string_view key, std::string_vi
 
 void sortCells(std::vector<CellRow>& cells) {
   std::ranges::sort(cells, [](const CellRow& a, const CellRow& b) {
-    // The cells of one key mostly share its text.
+    // Cells of one key mostly share its text, so compare the pointers first.
     if (a.key.data() != b.key.data()) {
       if (const auto order = a.key.compare(b.key)) return order < 0;
     }
@@ -38,11 +38,11 @@ void sortCells(std::vector<CellRow>& cells) {
   });
 }
 
-// Why the buckets of one key are no histogram of `count` values.
+// Why the buckets of one key are not a histogram of `count` values.
 const char* histogramFault(std::span<const CellRow> cells, std::uint64_t count) {
   std::uint64_t sum = 0;
   for (std::size_t i = 0; i < cells.size(); ++i) {
-    // Each occurrence of a key has a text of its own.
+    // Each occurrence of a key in the log has its own text.
     if (cells[i].key.data() != cells[0].key.data()) return "is there twice";
     if (i != 0 && cells[i - 1].upper > cells[i].lower) {
       return cells[i - 1].label == cells[i].label ? "has a bucket twice"

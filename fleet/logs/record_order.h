@@ -1,4 +1,4 @@
-// The rows of a record in their order, and what they must have in common.
+// Sorts the rows of a record and checks that they agree with each other.
 #pragma once
 
 #include <string>
@@ -7,9 +7,9 @@
 
 namespace tavrel::fleet {
 
-/// Sorts scalars and distributions by key, cells by key and interval. Yields why the rows are no
-/// log's: a key is there twice, buckets overlap, or a histogram does not count the values of its
-/// distribution. Empty when they are.
+/// Sorts scalars and distributions by key, and cells by key and interval. Returns why the rows
+/// cannot be those of a log: a key occurs twice, buckets overlap, or a histogram does not count
+/// exactly the values of its distribution. Empty when they can.
 std::string putInOrder(LogRecord& record);
 
 }  // namespace tavrel::fleet

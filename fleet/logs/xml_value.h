@@ -1,4 +1,4 @@
-// The elements of XML property lists that hold a value as text.
+// The elements of XML property lists whose text is a value.
 #pragma once
 
 #include <cstdint>
@@ -10,7 +10,7 @@ namespace tavrel::fleet {
 
 enum class XmlValue : std::uint8_t { kKey, kString, kInteger, kReal, kDate, kData };
 
-/// Hands the text of an element to the builder; false when the log is refused.
+/// Passes the text of an element to the builder; false when the log is refused.
 bool buildValue(LogBuilder& builder, XmlValue element, std::string_view text);
 
 }  // namespace tavrel::fleet

@@ -49,12 +49,12 @@ struct ApplicationRow {
 };
 
 struct LogRecord {
-  /// SHA-256 of the content, the same in every encoding: by it a log that comes twice is known.
+  /// SHA-256 of the content, the same in every encoding; identifies a log that comes twice
   std::array<std::byte, 32> digest{};
   std::int32_t day = 0;      ///< the reported day, in days since 1970 UTC
   std::int64_t created = 0;  ///< seconds since 1970 UTC
 
-  // Texts are in the arena. What a log or its metadata does not say is empty.
+  // Texts live in the arena. Whatever a log or its metadata does not say is empty.
   std::string_view osVersion;
   std::string_view
       previousOsVersion;  ///< differs from `osVersion` in the first log after an update
@@ -65,7 +65,7 @@ struct LogRecord {
   std::string_view preferredLanguage;
   std::string_view region;
 
-  // Each key, and each label of a key, occurs once.
+  // Each key occurs once, and so does each label within a key.
   std::vector<ScalarRow> scalars;
   std::vector<DistributionRow> distributions;
   std::vector<CellRow> cells;

@@ -1,4 +1,4 @@
-// Texts that live as long as their arena. Moving the arena leaves them where they are.
+// Texts that live as long as their arena. Moving the arena does not move them.
 #pragma once
 
 #include <cstddef>

@@ -18,7 +18,7 @@ std::string percentText(double share) {
   return page::shortNumber(std::round(std::abs(share) * 1000) / 10) + " %";
 }
 
-/// By the customary steps of effects in standard deviations.
+/// Uses the customary thresholds of effect sizes, in standard deviations.
 std::string strengthText(const Comparison& one) {
   constexpr double kSmall = 0.2;
   constexpr double kMedium = 0.5;
@@ -48,7 +48,7 @@ const char* kindText(KeyKind kind) {
   return kind == KeyKind::kScalar ? "daily value" : "daily mean";
 }
 
-/// With the kind where both kinds of the key are compared.
+/// Adds the kind when both kinds of the key are compared.
 std::string labelOf(const CompareAnswer& comparison, const Comparison& one) {
   const bool isAmbiguous =
       std::ranges::any_of(comparison.comparisons, [&](const Comparison& other) {
@@ -73,7 +73,7 @@ std::size_t changesOf(const CompareAnswer& comparison) {
 std::string nameOf(std::string_view key) {
   const catalogue::Entry* entry = catalogue::findStatistic(key);
   if (entry == nullptr || entry->meaning.empty()) return std::string(key);
-  // What follows explains the figure further.
+  // The rest of the meaning explains the figure further.
   return std::string(entry->meaning.substr(0, entry->meaning.find_first_of(";:")));
 }
 

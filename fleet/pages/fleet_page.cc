@@ -11,10 +11,10 @@ namespace tavrel::fleet {
 
 namespace {
 
-/// More make a page that nobody reads; `tavrel-fleet show` tells of each.
+/// Nobody would read a longer page; `tavrel-fleet show` describes each statistic.
 constexpr std::size_t kMostStatistics = 40;
 
-/// Whether a scalar tells how worn a drive is: docs/catalogue/channels.md and nand.md.
+/// Whether a scalar shows the wear of a drive: see docs/catalogue/channels.md and nand.md.
 bool tellsOfWear(const Key& key) {
   if (key.kind != KeyKind::kScalar) return false;
   for (const std::string_view end :
@@ -45,7 +45,7 @@ FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
     page.comparison = compare(engine, ledger, {versions->first, versions->second, days});
   }
 
-  // What changed most comes first, then distributions, then scalars.
+  // The largest changes come first, then distributions, then scalars.
   std::vector<Key> others;
   const auto add = [&](const Key& key) {
     if (tellsOfWear(key)) {

@@ -1,4 +1,4 @@
-// The fleet on one page, for people who decide about it.
+// The fleet on one page, for decision makers.
 #pragma once
 
 #include <optional>
@@ -16,13 +16,13 @@ struct FleetPage {
   std::optional<CompareAnswer> comparison;  ///< of the two newest versions
   std::vector<ShowAnswer> wear;             ///< of the flash, by version
   std::vector<ShowAnswer> statistics;       ///< others, by version
-  std::size_t furtherStatistics = 0;        ///< that the page has no room for
+  std::size_t furtherStatistics = 0;        ///< statistics that the page has no room for
 };
 
-/// Asks all questions of the page, in one run. Throws EngineError.
+/// Asks all questions of the page in one run. Throws EngineError.
 FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days);
 
-/// HTML in one file.
+/// Renders the page as one HTML file.
 std::string textOf(const FleetPage& page);
 
 }  // namespace tavrel::fleet

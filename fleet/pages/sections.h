@@ -15,7 +15,7 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary);
 void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison);
 void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers);
 
-/// What a key means, in short, when that is known; else the key.
+/// The short meaning of a key when it is known, else the key itself.
 std::string nameOf(std::string_view key);
 std::string_view unitOf(std::string_view key);
 /// "20 % higher (120 ms → 144 ms)".

@@ -1,4 +1,4 @@
-// The fleet's parts, and statistics by version.
+// The parts of the fleet, and its statistics by version.
 #include <algorithm>
 #include <cmath>
 
@@ -31,7 +31,7 @@ void writeGroups(page::HtmlWriter& html, const char* title, const SummaryPart& p
   }
 }
 
-/// Units that are words stand above the table.
+/// Leaves out units that are words: they stand above the table.
 std::string cellText(double value, std::string_view unit) {
   std::string text = page::figureText(value, unit);
   if (!unit.empty() && text.ends_with(" " + std::string(unit))) {
@@ -86,7 +86,7 @@ void writeSets(page::HtmlWriter& html, const ShowSide& side, const std::string& 
   table.end();
 }
 
-/// Buckets may be joined to different widths, so each stands in a row with its own label.
+/// Joined buckets may differ in width, so each has a row with its own label.
 void writeHistogramOf(page::HtmlWriter& html, const ShownSet& set, const std::string& name) {
   std::vector<page::Bar> bars;
   for (const Piece& piece : set.histogram.pieces) {

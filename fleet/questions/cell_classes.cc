@@ -10,8 +10,8 @@ namespace {
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
 
-/// Cells that overlap those of so many classes count only by their number of values: it bounds the
-/// time that logs with made-up cells can take.
+/// A cell that overlaps cells of this many classes counts only by its number of values: this bounds
+/// the time that logs with made-up cells can take.
 constexpr std::size_t kMostClasses = 64;
 
 void addTo(std::uint64_t& sum, std::uint64_t count) {
@@ -28,7 +28,7 @@ void CellClasses::add(LogIndex log, const Cell& cell) {
   counted.logs.push_back(log);
 }
 
-/// The most frequent cells choose their class first. `rest` gets those that have none.
+/// The most frequent cells choose their class first. `rest` gets cells that fit in no class.
 std::vector<CellClasses::Class> CellClasses::classes(std::vector<const Counted*>& rest) const {
   std::vector<const std::pair<const Ends, Counted>*> order;
   for (const auto& entry : cells_)
@@ -59,11 +59,11 @@ std::vector<CellClasses::Class> CellClasses::classes(std::vector<const Counted*>
   return result;
 }
 
-/// Appends the cells of a class of enough devices, neighbours joined until each has enough.
+/// Appends the cells of a class of enough devices, joining neighbours until each cell has enough.
 void CellClasses::joinSmall(const Class& all, std::size_t devicesAtLeast, DeviceCounter& counter,
                             Coarsened& result) const {
   const std::size_t first = result.cells.size();
-  bool isOpen = false;  // whether the last cell has too few devices yet
+  bool isOpen = false;  // whether the last cell still has too few devices
   counter.clear();
   for (const auto& [ends, counted] : all) {
     if (!isOpen) result.cells.push_back({ends.first, ends.second, 0});

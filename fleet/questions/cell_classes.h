@@ -14,21 +14,21 @@ namespace tavrel::fleet {
 
 /// Collects the cells of one key in one set of logs.
 ///
-/// Where whitelists drew the boundaries differently, cells overlap in part; they are then divided
-/// into classes of cells that do not. Within a class, neighbouring cells of too few devices are
-/// joined. Of classes that have too few devices altogether only the number of values is kept, as
-/// one cell over all numbers; when it has too few devices, too, the cell with the fewest values
-/// joins it. Each resulting cell is of enough devices, and so is whatever can be computed from
-/// them.
+/// Cells overlap in part where whitelists drew different boundaries; they are then divided into
+/// classes within which no cells overlap. Within a class, neighbouring cells of too few devices
+/// are joined. Of classes that have too few devices as a whole, only the number of values is
+/// kept, as one cell over all numbers; when that too has too few devices, the cell with the
+/// fewest values joins it. So each resulting cell is of enough devices, and so is everything that
+/// can be computed from the cells.
 class CellClasses {
  public:
   explicit CellClasses(const LogTable& table) : table_(table) {}
 
-  /// A cell whose ends are no interval, or that has no values, is left out.
+  /// Ignores a cell without values, or whose ends do not form an interval.
   void add(LogIndex log, const Cell& cell);
 
   struct Coarsened {
-    std::vector<Cell> cells;  ///< none when all of them together are of too few devices
+    std::vector<Cell> cells;  ///< none when all of them together have too few devices
     bool isJoined = false;    ///< whether some were joined
   };
   Coarsened coarsened(std::size_t devicesAtLeast) const;

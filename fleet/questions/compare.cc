@@ -35,7 +35,7 @@ std::vector<Side> sidesOf(const LogTable& table, const CompareRequest& request) 
   return sides;
 }
 
-/// What the logs of one side tell of one key.
+/// The logs of one side that have one key, and their moments.
 struct Sample {
   explicit Sample(const LogTable& logTable) : table(logTable), logs(logTable) {}
 
@@ -60,11 +60,11 @@ struct Sample {
   ExactMoments moments;
 };
 
-/// The mean of n logs of devices with m1, m2, ... logs each is at least as certain as that of
-/// n² / Σ m² independent values; it is exactly so uncertain when the logs of a device are all
-/// alike. The m are not known. Given the numbers of logs of the days, Σ m² is largest when the
-/// devices of each day are among those of every day with more logs; with these numbers in
-/// descending order it is then Σ (2t - 1) × number of day t, for t = 1, 2, ...
+/// If devices have m1, m2, ... logs, the mean of all n logs is at least as certain as that of n² /
+/// Σ m² independent values, and exactly as certain when the logs of each device are all alike. The
+/// m are unknown. Given the number of logs of each day, Σ m² is largest when the devices of a day
+/// are also among those of every day with more logs. With these numbers in descending order, it is
+/// then Σ (2t - 1) × (logs of day t), for t = 1, 2, ...
 double independentValues(std::vector<std::size_t> logsByDay) {
   std::sort(logsByDay.begin(), logsByDay.end(), std::greater<>());
   double logs = 0;
@@ -78,7 +78,7 @@ double independentValues(std::vector<std::size_t> logsByDay) {
   return logs * logs / squares;
 }
 
-/// What is left of a sample once its rows are read.
+/// What remains of a sample once its rows are read.
 struct Measured {
   ComparedSide side;
   double squaredError = 0;  // of the mean
@@ -90,7 +90,7 @@ struct SideResult {
   const LogSet& logsWithMean() const { return withMean ? *withMean : logs; }
 
   LogSet logs;
-  std::optional<LogSet> withMean;  // where that is not all logs
+  std::optional<LogSet> withMean;  // set when that is not all logs
   std::optional<Measured> measured;
 };
 using KeyResult = std::array<SideResult, 2>;
@@ -154,7 +154,7 @@ class Comparer {
         keys_(std::move(keys)),
         results_(keys_.size()) {}
 
-  /// Takes keys that no thread has taken until none is left, or until one has failed.
+  /// Takes keys that no thread has taken until none is left or a thread has failed.
   void work(Engine& engine) {
     try {
       for (std::size_t key = next_++; key < keys_.size() && !hasFailed_; key = next_++) {
@@ -187,7 +187,7 @@ class Comparer {
     if (failure_) std::rethrow_exception(failure_);
   }
 
-  /// In the order of the keys, whatever the threads did.
+  /// Goes by the order of the keys, whatever order the threads read them in.
   CompareAnswer answer(Ledger& ledger, const CompareRequest& request) {
     CompareAnswer answer{request, ledger.devicesAtLeast(), {}, 0, 0, 0};
     for (std::size_t i = 0; i < keys_.size(); ++i) {

@@ -1,4 +1,4 @@
-// Days that a question is about, and how people write them.
+// The days that a question covers, and how people write them.
 #pragma once
 
 #include <cstdint>
@@ -23,8 +23,8 @@ struct DayRange {
 /// "2026-11-01..2026-11-07"; "all days" for a range without ends.
 std::string textOf(const DayRange& days);
 
-/// Reads "FIRST..LAST", where either may be left out, or one day, each as "YYYY-MM-DD"; or a count
-/// of days up to `newest`. The error says what is wrong with the text.
+/// Reads "FIRST..LAST" or one day, each as "YYYY-MM-DD" (either end of a range may be left out), or
+/// a count of days up to `newest`. The error says what is wrong with the text.
 Expected<DayRange> parseDayRange(std::string_view text, std::int32_t newest);
 
 }  // namespace tavrel::fleet

@@ -9,12 +9,12 @@ namespace tavrel::fleet {
 
 namespace {
 
-// With the square of a double's 53 bits, 128 are enough. Of more bits there is only one value each.
+// Times the square of a 53-bit mantissa, this makes 128 bits. Longer mantissas have a count of 1.
 constexpr int kShortCountBits = 22;
 
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
-/// mantissa × 2^exponent, without the sign.
+/// The magnitude of a double: mantissa × 2^exponent.
 struct Parts {
   std::uint64_t mantissa;
   int exponent;
@@ -85,7 +85,7 @@ double ExactMoments::mean() const {
 double ExactMoments::squaredDeviations() const {
   if (count_ == 0 || overflowed_) return kNan;
 
-  // (count × squares - sum²) / count, without a rounding before the division.
+  // (count × squares - sum²) / count, exact up to the division.
   constexpr std::size_t kLimbs = 2 * kSumLimbs;
   static_assert(kLimbs > kSquaresLimbs);
   std::array<std::uint64_t, kLimbs> scaled[2] = {};

@@ -1,7 +1,7 @@
 // The mean and the squared deviations of many values, or of many summaries of values, exactly.
 //
-// Sums are kept without an error and rounded once, when they are asked for: the results are the
-// doubles nearest to the true ones, whatever the order of the terms.
+// Sums are exact and are rounded only when a result is read: results are the doubles nearest to the
+// true values, whatever the order of the terms.
 #pragma once
 
 #include <cstdint>
@@ -12,16 +12,16 @@ namespace tavrel::fleet {
 
 class ExactMoments {
  public:
-  /// `count` values of this mean whose squared deviations from it add up to `squaredDeviations`;
-  /// both are finite.
+  /// Adds `count` values with this mean, whose squared deviations from it sum to
+  /// `squaredDeviations`. Both must be finite.
   void add(double mean, double squaredDeviations, std::uint64_t count);
   void add(double value) { add(value, 0, 1); }
   void add(std::int64_t value);
 
-  /// Stays at 2^64 - 1 when there are more.
+  /// Saturates at 2^64 - 1.
   std::uint64_t count() const { return count_; }
 
-  /// The mean of all values. Not-a-number without values, and when the count does not fit.
+  /// The mean of all values. Not-a-number without values, or when the count overflowed.
   double mean() const;
 
   /// The sum of squared deviations from `mean()`, not divided by the count. Not-a-number when the
@@ -29,9 +29,9 @@ class ExactMoments {
   double squaredDeviations() const;
 
  private:
-  // The last bit of the sum weighs that of the smallest double; of the sum of squares, its square.
+  // The lowest bit of the sum is worth the smallest double; that of the sum of squares, its square.
   static constexpr int kLastBit = -1074;
-  static constexpr std::size_t kSumLimbs = 34;      // below 2^(1024 + 64) either way
+  static constexpr std::size_t kSumLimbs = 34;      // magnitude below 2^(1024 + 64)
   static constexpr std::size_t kSquaresLimbs = 67;  // below 2^(2048 + 64)
 
   bool grow(std::uint64_t count);

@@ -54,7 +54,7 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
                             std::size_t logsAtLeast) {
   if (by == GroupBy::kNone) return {{{PartKind::kWhole}, logs}};
 
-  // Each attribute as a number into its values.
+  // Reduces each attribute to an index into its values.
   const Attribute of = by == GroupBy::kOs       ? Attribute::kOs
                        : by == GroupBy::kRegion ? Attribute::kRegion
                                                 : Attribute::kDigest;

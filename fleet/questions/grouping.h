@@ -12,12 +12,12 @@
 
 namespace tavrel::fleet {
 
-/// Orders texts as people number versions: "4.9" before "4.10".
+/// Orders texts the way people number versions: "4.9" before "4.10".
 bool versionLess(std::string_view a, std::string_view b);
 
-/// One group for each value of the attribute that occurs among `logs`, in their order (versions as
-/// numbered, days as they passed); `kNone` has one group. Values with fewer than `logsAtLeast`
-/// logs, and those after the thousand most frequent ones, come as one group of the kind kOther.
+/// One group for each value of the attribute that occurs among `logs`, in order (versions by
+/// number, days by date); `kNone` yields one group. Values with fewer than `logsAtLeast` logs, and
+/// those beyond the thousand most frequent, form one group of the kind kOther.
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast);
 

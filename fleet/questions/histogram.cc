@@ -14,7 +14,7 @@ std::uint64_t saturated(Uint128 value) {
   return value > kMost ? kMost : lowHalf(value);
 }
 
-/// The r-th smallest ends, for ascending ranks r, when each cell has its end `count` times.
+/// The r-th smallest ends, for ascending ranks r, when each cell's end occurs `count` times.
 std::vector<double> endsAt(std::vector<std::pair<double, std::uint64_t>> ends,
                            std::span<const std::uint64_t> ranks) {
   std::sort(ends.begin(), ends.end());
@@ -39,8 +39,8 @@ std::vector<Piece> piecesOf(std::span<const Cell> cells) {
   boundaries.erase(std::unique(boundaries.begin(), boundaries.end()), boundaries.end());
   if (boundaries.empty()) return {};
 
-  // Of each piece: what its own cells count, and by how much the wider cells over it count more
-  // than those over the piece before.
+  // For each piece: the count of the cells that are exactly this piece, and by how much the wider
+  // cells over it count more than those over the previous piece.
   std::vector<Uint128> own(boundaries.size());
   std::vector<Uint128> wider(boundaries.size());
   const auto position = [&](double boundary) {

@@ -1,4 +1,4 @@
-// Histograms of many logs as one, also of logs whose whitelists drew the boundaries differently.
+// Combines the histograms of many logs, even when whitelists drew their boundaries differently.
 #pragma once
 
 #include <cstdint>
@@ -8,7 +8,7 @@
 
 namespace tavrel::fleet {
 
-/// `count` values above `lower`, up to and including `upper`. `lower` is less than `upper`.
+/// `count` values above `lower`, up to and including `upper`; `lower` is less than `upper`.
 struct Cell {
   double lower = 0;
   double upper = 0;
@@ -17,8 +17,8 @@ struct Cell {
   bool operator==(const Cell&) const = default;
 };
 
-/// Between two neighbouring boundaries there are at least `least` and at most `most` values: a cell
-/// that spans several pieces may have its values in any of them. Counts stay at 2^64 - 1.
+/// A range between neighbouring boundaries, with at least `least` and at most `most` values: those
+/// of a cell that spans several pieces may lie in any of them. Counts saturate at 2^64 - 1.
 struct Piece {
   double lower = 0;
   double upper = 0;
@@ -28,7 +28,7 @@ struct Piece {
   bool operator==(const Piece&) const = default;
 };
 
-/// The pieces between all boundaries of the cells, ascending.
+/// The pieces between the boundaries of all cells, in ascending order.
 std::vector<Piece> piecesOf(std::span<const Cell> cells);
 
 std::uint64_t valuesOf(std::span<const Cell> cells);
@@ -41,13 +41,13 @@ struct Interval {
   bool operator==(const Interval&) const = default;
 };
 
-/// Where the values lie that have rank ceil(percent × n / 100) when the n values of the cells
-/// ascend: nothing narrower follows from the cells. Nothing without values. `percents` ascend, from
-/// 1 to 100.
+/// For each percent, the narrowest interval that the cells allow for the value of rank
+/// ceil(percent × n / 100) among their n values in ascending order. Nothing without values.
+/// `percents` ascend, from 1 to 100.
 std::vector<Interval> percentilesOf(std::span<const Cell> cells,
                                     std::span<const unsigned> percents);
 
-/// The rank, from 1, of a percentile among `count` values, by the nearest-rank rule.
+/// The rank, counted from 1, of a percentile among `count` values, by the nearest-rank rule.
 std::uint64_t nearestRank(std::uint64_t count, unsigned percent);
 
 }  // namespace tavrel::fleet

@@ -1,7 +1,7 @@
-// What one run has shown, and what it therefore must not show.
+// Records what one run has shown, and so decides what it must not show any more.
 //
-// A set of logs of fewer than K devices is never shown. Nor is one from which, together with what
-// was shown before of the same subject, somebody could tell such a set by a subtraction.
+// A set of logs of fewer than K devices is never shown. Nor is a set from which such a small set
+// could be derived by subtraction, given what was shown before about the same subject.
 #pragma once
 
 #include <cstddef>
@@ -17,7 +17,7 @@
 namespace tavrel::fleet {
 
 inline constexpr std::size_t kDefaultDevicesAtLeast = 10;
-/// Of two devices, the owner of one could tell the figures of the other.
+/// With two devices, the owner of one could deduce the figures of the other.
 inline constexpr std::size_t kFewestDevicesAtLeast = 3;
 
 class Ledger {
@@ -29,9 +29,9 @@ class Ledger {
   std::size_t devicesAtLeast() const { return devicesAtLeast_; }
   bool hasEnough(const LogSet& logs) const { return logs.devices(table_) >= devicesAtLeast_; }
 
-  /// Whether the set has enough devices, equals each shown set of the subject or differs from it by
-  /// enough devices, and leaves nothing of too few devices when all its shown parts are taken away,
-  /// from it or from a shown set that includes it.
+  /// True when all of this holds: the set has enough devices; it equals each shown set of the
+  /// subject or differs from it by enough devices; and subtracting all shown parts, from it or from
+  /// a shown set that includes it, leaves either nothing or enough devices.
   bool allows(const std::string& subject, const LogSet& logs) const;
   void noteShown(const std::string& subject, const LogSet& logs);
 
@@ -40,8 +40,8 @@ class Ledger {
   const Shown& shown() const { return shown_; }
 
  private:
-  /// Whether the whole without the parts of it that are shown or to be shown is empty or has enough
-  /// devices.
+  /// Whether the whole, without those of its parts that are already shown or to be shown, is
+  /// empty or has enough devices.
   bool leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& added) const;
 
   const LogTable& table_;
@@ -51,12 +51,12 @@ class Ledger {
   std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;
 };
 
-/// What answers about a statistic are about, as subjects of the ledger: all figures but means, and
-/// means. They differ when logs of a distribution have no mean.
+/// The ledger's subjects of an answer about a statistic: one for the means, one for all other
+/// figures. They cover different logs when some logs of a distribution have no mean.
 std::string subjectOf(KeyKind kind, const std::string& key);
 std::string subjectOfMeans(KeyKind kind, const std::string& key);
 
-/// One of the kind kOther is not shown by itself.
+/// A group of the kind kOther is never shown by itself.
 struct Group {
   PartName name;
   LogSet logs;
@@ -66,16 +66,16 @@ struct Group {
 /// A set of logs and its parts.
 struct Division {
   LogSet whole;
-  bool isShown = false;  ///< when not, nothing of it may be shown
+  bool isShown = false;  ///< when false, nothing of it may be shown
   std::vector<Group> groups;
-  /// How many values were joined as the last group, of the kind kOther.
+  /// How many values were joined into the last group, which is of the kind kOther.
   std::size_t joined = 0;
 };
 
-/// Divides the union of the groups, which have no log in common, into parts that may be shown, and
-/// notes these and the whole as shown. Groups of too few devices are joined, and with them as many
-/// of the smallest others as it takes: what remains of the whole without the shown groups must have
-/// enough devices, too. Empty groups are dropped; a whole that cannot be divided has no groups.
+/// Divides the union of the groups, which share no log, into parts that may be shown, and notes the
+/// parts and the whole as shown. Joins groups of too few devices, and as many of the smallest
+/// others as it takes for what remains of the whole without the shown groups to have enough
+/// devices, too. Drops empty groups; a whole that cannot be divided has no groups.
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups);
 
 }  // namespace tavrel::fleet

@@ -10,7 +10,7 @@ std::size_t ones(std::uint64_t word) {
   return static_cast<std::size_t>(std::popcount(word));
 }
 
-/// The bits of the day's logs that are set; `wordAt` yields the words of a set.
+/// How many of the day's logs are set; `wordAt` yields the words of a set.
 template <class WordAt>
 std::size_t onesOf(const LogTable::Day& day, const WordAt& wordAt) {
   std::size_t count = 0;

@@ -1,7 +1,7 @@
-// Sets of logs of one LogTable, and how many devices they are of.
+// Sets of logs of one LogTable, and how many devices they are known to come from.
 //
-// A log is one day of one device and does not say which, so nobody can count devices. But on one
-// day each has one log: a set is of at least as many devices as it has logs of any one day.
+// A log covers one day of one device but does not say which device, so devices cannot be counted.
+// But each device has one log per day: a set has at least as many devices as logs of any one day.
 #pragma once
 
 #include <bit>
@@ -35,13 +35,13 @@ class LogSet {
   bool operator==(const LogSet&) const = default;
 
   std::size_t logs() const;
-  /// The largest number of logs of one day.
+  /// The largest number of logs on one day.
   std::size_t devices(const LogTable& table) const;
   /// The number of logs of each day of the table.
   std::vector<std::size_t> logsByDay(const LogTable& table) const;
 
   LogSet without(const LogSet& other) const;
-  /// Whether the logs that only one of the two sets has are of at least so many devices.
+  /// Whether the logs that only one of the two sets has come from at least `devices` devices.
   bool differsByAtLeast(const LogSet& other, std::size_t devices, const LogTable& table) const;
   std::size_t hash() const;
 
@@ -55,10 +55,10 @@ class DeviceCounter {
   explicit DeviceCounter(const LogTable& table)
       : table_(table), seen_(table.size()), ofDay_(table.days().size()) {}
 
-  /// A log that is there already changes nothing.
+  /// A log that was already inserted changes nothing.
   void insert(LogIndex log);
   std::size_t devices() const { return devices_; }
-  /// Begins an empty set; takes the time of the logs in the old one.
+  /// Empties the set; takes time proportional to the number of its logs.
   void clear();
 
  private:

@@ -11,7 +11,7 @@ namespace tavrel::fleet {
 
 namespace {
 
-/// Numbers texts in the order in which they come.
+/// Numbers texts in the order of their first occurrence.
 class Interner {
  public:
   explicit Interner(std::vector<std::string>& texts) : texts_(texts) {}

@@ -1,4 +1,4 @@
-// The logs of the fleet in memory: what questions select, group and count them by.
+// The fleet's logs in memory, with what questions select, group and count them by.
 #pragma once
 
 #include <array>
@@ -29,10 +29,10 @@ class LogTable {
 
   std::size_t size() const { return logs_.size(); }
 
-  /// `kNoLog` for a log that came after the table was read.
+  /// `kNoLog` for a log that was added after the table was read.
   LogIndex find(LogId log) const;
 
-  /// The logs are in the order of their days: those of one day follow each other.
+  /// The logs are in the order of their days, so those of one day are contiguous.
   struct Day {
     std::int32_t day = 0;
     LogIndex begin = 0;
@@ -43,7 +43,7 @@ class LogTable {
   /// The position of its day in `days()`.
   std::uint32_t dayIndex(LogIndex log) const { return logs_[log].day; }
 
-  /// An attribute is a number into the texts that occur; what a log does not say is the text "".
+  /// An attribute is an index into its texts; the text is "" when the log does not say.
   std::uint32_t attribute(Attribute of, LogIndex log) const {
     return logs_[log].attributes[static_cast<std::size_t>(of)];
   }
@@ -69,8 +69,8 @@ class LogTable {
   std::vector<Log> logs_;
   std::vector<Day> days_;
   std::array<std::vector<std::string>, kAttributes> texts_;
-  std::vector<LogIndex> direct_;  // by identity, when these are numbered closely
-  std::vector<Slot> slots_;       // a hash table otherwise; its size is a power of 2
+  std::vector<LogIndex> direct_;  // by LogId, when the identifiers are dense
+  std::vector<Slot> slots_;       // otherwise, a hash table; its size is a power of 2
 };
 
 }  // namespace tavrel::fleet

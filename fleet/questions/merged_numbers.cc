@@ -8,7 +8,7 @@ namespace tavrel::fleet {
 
 namespace {
 
-/// Negative zero is less than zero, or the result would depend on the order.
+/// Negative zero is less than zero; otherwise the result would depend on the order.
 bool isLess(double a, double b) {
   return a < b || (a == b && std::signbit(a) && !std::signbit(b));
 }

@@ -1,4 +1,4 @@
-// The five numbers of the values of many logs, as if one log had counted them all.
+// The five numbers over the values of many logs, as if one log had counted all of them.
 #pragma once
 
 #include <cstddef>
@@ -10,23 +10,23 @@
 
 namespace tavrel::fleet {
 
-/// Whether a mean can be made of these and others: mean and squared deviations are not finite when
-/// a value was not, or when the values lie too far apart.
+/// Whether a merged mean can use these numbers: mean and squared deviations are not finite when a
+/// value was not, or when the values lie too far apart.
 bool hasMean(const FiveNumbers& numbers);
 
 class MergedNumbers {
  public:
-  /// A summary without values changes nothing. One without a mean counts, but for mean and
-  /// deviations.
+  /// A summary without values changes nothing. One without a mean contributes to
+  /// all but mean and deviations.
   void add(const FiveNumbers& numbers);
 
-  /// Five zeros without values, as in a log. The count stays at 2^64 - 1 when there are more.
+  /// Five zeros when there are no values, as in a log. The count saturates at 2^64 - 1.
   /// Minimum and maximum are not-a-number only when they are in every log. Mean and squared
-  /// deviations are the doubles nearest to the exact ones; not-a-number when no summary has a mean
-  /// or the count does not fit.
+  /// deviations are the doubles nearest to the exact results; not-a-number when no summary has
+  /// a mean or the count overflows.
   FiveNumbers numbers() const;
 
-  /// Of the values that the mean is of; nothing without a mean.
+  /// Of the values that enter the mean; nothing without a mean.
   std::optional<double> standardDeviation() const;
 
   std::size_t logsWithoutMean() const { return logsWithoutMean_; }
@@ -40,7 +40,7 @@ class MergedNumbers {
   std::size_t logsWithoutMean_ = 0;
 };
 
-/// The root of the mean squared deviation; nothing when that is no finite number.
+/// The root of the mean squared deviation; nothing when it is not finite.
 std::optional<double> standardDeviation(double squaredDeviations, std::uint64_t values);
 
 }  // namespace tavrel::fleet

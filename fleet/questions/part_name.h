@@ -1,4 +1,4 @@
-// What the parts of a set of logs are called, so that no text in a log can pass for a name of ours.
+// Names the parts of a set of logs so that no text in a log can be mistaken for a name of ours.
 #pragma once
 
 #include <cstdint>
@@ -9,8 +9,8 @@ namespace tavrel::fleet {
 enum class PartKind : std::uint8_t {
   kWhole,
   kValue,    ///< the logs with one value of an attribute
-  kNotTold,  ///< the logs that do not say it
-  kOther,    ///< those of several values, none of which may be shown by itself
+  kNotTold,  ///< the logs without the attribute
+  kOther,    ///< logs with several values, none of which may be shown by itself
 };
 
 struct PartName {

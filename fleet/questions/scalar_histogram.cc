@@ -25,13 +25,13 @@ std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
     }
   }
   std::vector<double> boundaries;
-  // No bucket lies wholly beyond all values.
+  // No bucket lies entirely outside the range of the values.
   const auto smallest = static_cast<double>(ascending.front());
   const auto largest = static_cast<double>(ascending.back());
   const double first = std::max(std::floor(low / step) - kBeyond, std::floor(smallest / step));
   const double last = std::min(std::ceil(high / step) + kBeyond, std::ceil(largest / step));
   for (double i = first; i <= last; i += 1) {
-    // Beyond 2^53 neighbouring multiples can be one number.
+    // Beyond 2^53, neighbouring multiples can be the same number.
     if (boundaries.empty() || boundaries.back() < i * step) boundaries.push_back(i * step);
     if (i + 1 == i) break;
   }

@@ -1,4 +1,4 @@
-// Buckets for the values of a scalar over devices.
+// Chooses histogram buckets for the values of a scalar across devices.
 #pragma once
 
 #include <cstdint>
@@ -9,9 +9,9 @@
 
 namespace tavrel::fleet {
 
-/// Boundaries at round numbers (1, 2 or 5 times a power of ten apart) that divide the middle nine
-/// tenths of the values into about ten buckets, with a few more on each side. `ascending` is not
-/// empty.
+/// Boundaries at round numbers (1, 2 or 5 times a power of ten apart) that divide the middle
+/// 90 percent of the values into about ten buckets, with a few more on each side.
+/// `ascending` must not be empty.
 std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending);
 
 /// The bucket of a value: above one boundary, up to and including the next.

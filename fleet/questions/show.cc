@@ -17,7 +17,7 @@ namespace {
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
-/// The rows of the key, by log. Distributions without values are left out.
+/// The rows of the key, ordered by log. Distributions without values are left out.
 struct Rows {
   std::vector<std::pair<LogIndex, std::int64_t>> scalars;
   std::vector<std::pair<LogIndex, FiveNumbers>> distributions;
@@ -52,7 +52,7 @@ Rows readRows(Engine& engine, const LogTable& table, const ShowRequest& request)
   return rows;
 }
 
-/// Tells of the parts of one side.
+/// Describes the parts of one side.
 class SideAnswer {
  public:
   SideAnswer(Ledger& ledger, const Rows& rows, std::string subjectOfMeans)
@@ -145,8 +145,8 @@ class SideAnswer {
     });
   }
 
-  /// The whole is made of the parts' cells after these were coarsened: by a subtraction it tells
-  /// nothing that they do not.
+  /// The histogram of the whole is made of the parts' cells after these were coarsened, so
+  /// subtracting parts from it reveals nothing new.
   void fillHistograms(std::vector<ShownSet>& sets, ShownSet& whole) const {
     const std::vector<double> boundaries = scalarBoundaries(sets.size());
     std::vector<CellClasses> classes(sets.size(), CellClasses(table_));
@@ -159,8 +159,8 @@ class SideAnswer {
       classes[partOf_[log]].add(log, cell);
       if (cell.lower < cell.upper) told[log] += cell.count;
     }
-    // Values of which no histogram tells may lie anywhere. Were they left out, the histogram would
-    // be of other logs than the five numbers.
+    // Values that no histogram counts may lie anywhere. Without them, the histogram would cover
+    // other logs than the five numbers do.
     for (const auto& [log, numbers] : rows_.distributions) {
       if (partOf_[log] == sets.size() || told.empty() || told[log] >= numbers.count) continue;
       classes[partOf_[log]].add(log, {-kInfinity, kInfinity, numbers.count - told[log]});
@@ -187,7 +187,7 @@ class SideAnswer {
   }
 
   void fill(HistogramAnswer& answer, const std::vector<Cell>& cells) const {
-    // One bucket over all numbers tells nothing.
+    // One bucket over all numbers would say nothing.
     if (std::all_of(cells.begin(), cells.end(), [](const Cell& cell) {
           return cell.lower == -kInfinity && cell.upper == kInfinity;
         })) {
@@ -205,7 +205,7 @@ class SideAnswer {
   std::vector<std::size_t> partOf_;  // of each log; the number of parts when it is in none
 };
 
-/// The logs that have the key and that the request puts on a side.
+/// The logs that have the key and that the request puts on a given side.
 LogSet logsOf(const LogTable& table, const Rows& rows, const auto& isOnSide) {
   LogSet logs(table);
   const auto take = [&](const auto& some) {

@@ -1,5 +1,5 @@
 // The question about one statistic: how it is distributed over the devices, or what all its values
-// give together; whole, divided by an attribute of the logs, and beside other days or versions.
+// amount to; as a whole, divided by an attribute of the logs, or next to other days or versions.
 #pragma once
 
 #include <array>
@@ -22,18 +22,18 @@ inline constexpr std::array<unsigned, 5> kPercents = {5, 25, 50, 75, 95};
 
 struct ShowRequest {
   std::string key;
-  KeyKind kind = KeyKind::kScalar;  ///< a distribution brings its histogram along
+  KeyKind kind = KeyKind::kScalar;  ///< a distribution includes its histogram
   GroupBy by = GroupBy::kNone;
   DayRange days{};
-  /// At most one: other days, which must not overlap the first, or a version. With a version, the
-  /// first side is the logs of all other ones.
+  /// At most one is set: other days, which must not overlap the first, or a version. With a
+  /// version, the first side consists of the logs of all other versions.
   std::optional<DayRange> againstDays{};
   std::optional<std::string> againstVersion{};
   /// Leaves groups of too few devices out of the whole, instead of joining them.
   bool leavesSmallOut = false;
 };
 
-/// Of a scalar: the values of the logs, one a day and device.
+/// For a scalar: the values of the logs, one for each day and device.
 struct ScalarSpread {
   std::int64_t minimum = 0;
   std::int64_t maximum = 0;
@@ -42,20 +42,20 @@ struct ScalarSpread {
   std::array<std::int64_t, kPercents.size()> percentiles{};  ///< by the nearest rank
 };
 
-/// Of a distribution.
+/// For a distribution.
 struct MergedAnswer {
-  /// Mean and squared deviations are of the logs that have them, and not-a-number when none has,
-  /// when these are of too few devices, or when the count does not fit.
+  /// Mean and squared deviations cover the logs that have them. They are not-a-number when no log
+  /// has, when those that do are of too few devices, or when the count overflows.
   FiveNumbers numbers;
   std::optional<double> deviation;  ///< the standard deviation; nothing without a mean
-  std::size_t logsWithoutMean = 0;  ///< whose mean or deviations are not finite
+  std::size_t logsWithoutMean = 0;  ///< logs whose mean or deviations are not finite
 };
 
 struct HistogramAnswer {
   std::uint64_t values = 0;
   std::vector<Piece> pieces;  ///< empty when there is none to show
-  bool isJoined = false;      ///< whether buckets were joined, because they had too few devices
-  /// Of a distribution: where the percentiles lie.
+  bool isJoined = false;      ///< whether buckets were joined because they had too few devices
+  /// For a distribution: the intervals that contain the percentiles.
   std::vector<Interval> percentiles;
 };
 
@@ -71,7 +71,7 @@ struct ShownSet {
 
 struct ShowSide {
   std::string title;     ///< days, "version X" or "all other versions"
-  bool isShown = false;  ///< when not, it has too few devices, and the rest is empty
+  bool isShown = false;  ///< when false, it has too few devices, and the rest is empty
   ShownSet whole;
   std::vector<ShownSet> groups;
   std::size_t joined = 0;  ///< groups that are shown as one
@@ -83,7 +83,7 @@ struct ShowAnswer {
   std::vector<ShowSide> sides;  ///< one, or two with `against`
 };
 
-/// Throws EngineError. The days of `request` overlap none of `againstDays`.
+/// Throws EngineError. `request.days` must not overlap `request.againstDays`.
 ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request);
 
 }  // namespace tavrel::fleet

@@ -9,8 +9,8 @@ namespace tavrel::fleet {
 
 namespace {
 
-/// ln Γ(x + 1/2) - ln Γ(x), for x > 0. Its asymptotic series holds from some size on; below, the
-/// recurrence Γ(x + 1) = x Γ(x) leads there.
+/// ln Γ(x + 1/2) - ln Γ(x), for x > 0. The asymptotic series is accurate only for large x; for
+/// smaller ones, the recurrence Γ(x + 1) = x Γ(x) leads there.
 double logGammaStep(double x) {
   constexpr double kLarge = 20;
   double product = 1;
@@ -49,8 +49,8 @@ double betaFraction(double a, double b, double x) {
 
 double studentTwoSided(double t, double degreesOfFreedom) {
   if (std::isinf(t)) return 0;
-  // From here on the normal distribution differs by about t^4 / (4 degreesOfFreedom), relatively,
-  // and the fraction below takes ever more steps.
+  // Above this, the normal distribution differs relatively by about t^4 / (4 degreesOfFreedom), and
+  // the fraction below takes more and more steps.
   constexpr double kNormal = 1e8;
   if (degreesOfFreedom > kNormal) return std::erfc(std::abs(t) / std::numbers::sqrt2);
 

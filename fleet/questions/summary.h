@@ -16,20 +16,20 @@ struct CountedGroup {
   PartName name;
   std::size_t logs = 0;
   std::size_t devices = 0;    ///< the largest number of its logs on one day
-  std::int32_t firstDay = 0;  ///< with enough devices
+  std::int32_t firstDay = 0;  ///< the first day with enough devices
   std::int32_t lastDay = 0;
 };
 
 struct SummaryPart {
   GroupBy by = GroupBy::kNone;
-  std::vector<CountedGroup> groups;  ///< empty when the logs cannot be divided by this
+  std::vector<CountedGroup> groups;  ///< empty when the logs cannot be divided by this attribute
   std::size_t joined = 0;            ///< groups that are shown as one
 };
 
 struct SummaryAnswer {
   std::size_t devicesAtLeast = 0;
-  DayRange days;         ///< those asked for
-  bool isShown = false;  ///< when not, there are too few devices, and the rest is empty
+  DayRange days;         ///< the days asked for
+  bool isShown = false;  ///< when false, there are too few devices, and the rest is empty
   CountedGroup whole;
   std::vector<SummaryPart> parts;  ///< by version, region, whitelist and day
   std::size_t scalarKeys = 0;
@@ -37,7 +37,7 @@ struct SummaryAnswer {
   std::size_t histogramKeys = 0;
 };
 
-/// The statistics that enough devices have on these days. Reads all rows. Throws EngineError.
+/// The statistics that have enough devices on these days. Reads all rows. Throws EngineError.
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const DayRange& days);
 
 /// Throws EngineError.

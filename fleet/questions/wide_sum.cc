@@ -51,8 +51,8 @@ bool subtract(std::span<const std::uint64_t> a, std::span<const std::uint64_t> b
 
 double nearestQuotient(std::span<const std::uint64_t> number, std::uint64_t divisor, int exponent,
                        bool isNegative) {
-  // With two limbs below the number, every quotient that is not 0 has more than 64 bits, and a
-  // remainder, which is at least 1 / 2^64 of the number's last bit, has one of them.
+  // With two more limbs below the number, every quotient other than 0 has more than 64 bits, and a
+  // remainder, at least 1 / 2^64 of the number's last bit, still shows in one of them.
   constexpr std::size_t kExtra = 2;
   std::vector<std::uint64_t> quotient(number.size() + kExtra);
   Uint128 remainder = 0;

@@ -1,5 +1,5 @@
-// Sums of 128- and 192-bit products at any place of a wide fixed-point number. Nothing is rounded,
-// so the order of the terms does not matter.
+// Adds 128- and 192-bit products at any bit position of a wide fixed-point number. Nothing is
+// rounded, so the order of the terms does not matter.
 #pragma once
 
 #include <array>
@@ -21,8 +21,8 @@ inline std::uint64_t highHalf(Uint128 value) {
 /// Least significant limb first.
 using Product = std::array<std::uint64_t, 3>;
 
-/// Positive and negative terms are summed apart: a carry then travels far only as often as a
-/// counter overflows. The caller sees to it that neither sum outgrows its limbs.
+/// Positive and negative terms are summed separately: a carry then travels far only as rarely as a
+/// counter overflows. The caller must ensure that neither sum outgrows its limbs.
 template <std::size_t kLimbs>
 class WideSum {
  public:
@@ -70,12 +70,12 @@ class WideSum {
   std::array<Limbs, 2> sums_{};
 };
 
-/// result = |a - b|; whether a < b. All have the same size.
+/// Sets result = |a - b| and returns whether a < b. All three have the same size.
 bool subtract(std::span<const std::uint64_t> a, std::span<const std::uint64_t> b,
               std::span<std::uint64_t> result);
 
-/// The double nearest to ±(number × 2^exponent / divisor), halves to even. The exponent may be
-/// anything; beyond the range of a double the result is an infinity. The divisor is not 0.
+/// The double nearest to ±(number × 2^exponent / divisor), ties to even. The exponent may have any
+/// value; beyond the range of a double, the result is an infinity. The divisor must not be 0.
 double nearestQuotient(std::span<const std::uint64_t> number, std::uint64_t divisor, int exponent,
                        bool isNegative);
 

@@ -52,7 +52,7 @@ class Archive {
     const int code = archive_read_next_header(archive_.get(), &entry);
     if (code == ARCHIVE_EOF) return nullptr;
     if (code != ARCHIVE_OK && code != ARCHIVE_WARN) return note(), nullptr;
-    // What is skipped is expanded, too.
+    // Count skipped members as well: they are expanded, too.
     if (archive_filter_bytes(archive_.get(), 0) > most_ || archive_entry_size(entry) > most_) {
       failure_ = format("expands to more than %lld times its size", limits::kArchiveRatio);
       return nullptr;
@@ -60,7 +60,7 @@ class Archive {
     return entry;
   }
 
-  /// The content of the member. False when it is longer than the limit, or after a failure.
+  /// Reads the content of the member. False when it exceeds the limit, or after a failure.
   bool read(std::size_t limit, std::string& content) {
     content.clear();
     const void* block = nullptr;
@@ -90,7 +90,7 @@ class Archive {
     void operator()(archive* opened) const { archive_read_free(opened); }
   };
   std::unique_ptr<archive, Free> archive_;
-  std::int64_t most_ = 0;  // bytes that it may expand to
+  std::int64_t most_ = 0;  // how many bytes it may expand to
   std::string failure_;
 };
 

@@ -8,8 +8,8 @@
 
 namespace tavrel::fleet {
 
-/// Hands out the members that are logs, in the order of the archive. It is read twice: the metadata
-/// of a log comes after it.
+/// Hands out the members that are logs, in the order of the archive. Reads the archive twice,
+/// because the metadata of a log comes after it.
 void visitArchive(const std::string& path, const UploadLines& lines, const SourceSink& sink);
 
 }  // namespace tavrel::fleet

@@ -1,4 +1,4 @@
-// Limits on what is looked at for logs, with their units and reasons.
+// Limits on the search for logs, with their units and reasons.
 #pragma once
 
 #include <cstddef>
@@ -12,7 +12,7 @@ inline constexpr std::size_t kFolderDepth = 64;
 /// Bytes of the metadata of one log: a few short texts.
 inline constexpr std::size_t kMetadataBytes = 1U << 20;
 
-/// How many times its size an archive may expand to, beyond the bytes that are free. Logs of many
+/// How many times its own size an archive may expand to, on top of a free allowance. Logs of many
 /// devices have much in common, but not that much.
 inline constexpr std::int64_t kArchiveRatio = 1'000;
 inline constexpr std::int64_t kArchiveFreeBytes = 64 << 20;

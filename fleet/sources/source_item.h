@@ -1,4 +1,4 @@
-// What is found where logs are: a log that is still to be read, or why something is not.
+// An item that a search for logs found: a log still to be read, or why something is not read.
 #pragma once
 
 #include <cstdint>
@@ -14,8 +14,8 @@ struct SourceItem {
   enum class Kind : std::uint8_t {
     kFile,     ///< the file `path`
     kContent,  ///< the bytes in `content`
-    kRefused,  ///< a log that cannot be had
-    kSkipped,  ///< nothing that could be a log, such as a link
+    kRefused,  ///< a log that cannot be obtained
+    kSkipped,  ///< something that cannot be a log, such as a link
     kOther,    ///< a log of another kind
   };
   Kind kind = Kind::kFile;
@@ -25,10 +25,10 @@ struct SourceItem {
   std::string reason;   // of `kRefused` and `kSkipped`
   std::optional<LogMetadata> metadata;
   bool hasSidecar = false;  // NAME.metadata.plist is beside the file
-  bool mayBeLink = false;   // the user has named the file
+  bool mayBeLink = false;   // because the user named the file
 };
 
-/// Takes what is found, in order. It may wait, and may throw to end the search.
+/// Takes the items in order. It may block, and may throw to end the search.
 using SourceSink = std::function<void(SourceItem)>;
 
 }  // namespace tavrel::fleet

@@ -30,7 +30,7 @@ void give(const SourceSink& sink, Kind kind, std::string name, std::string reaso
   sink(std::move(item));
 }
 
-// Of the system's last failure.
+// Describes the latest system error.
 std::string cannot(std::string_view what) {
   return format("cannot be %s: %s", what, std::strerror(errno));
 }
@@ -109,7 +109,7 @@ class Visit {
     const std::string_view name = withoutGzip(fileNameOf(path));
     const LogMetadata* const line = lines_.find(folderNameOf(path), name);
     if (line != nullptr && !hasSidecar) item.metadata = *line;
-    // With a sidecar, its reader decides.
+    // With a sidecar, the thread that reads it decides.
     if (!hasSidecar && isOtherLog(name, line)) item.kind = Kind::kOther;
     sink_(std::move(item));
   }
@@ -166,7 +166,7 @@ Expected<std::string> readSourceFile(const std::string& path, std::size_t limit,
   if (static_cast<std::uint64_t>(status.st_size) > limit) {
     return Error{format("has more than %zu bytes", limit)};
   }
-  // One byte more than it has shows that all was read.
+  // Reading one byte more than its size shows whether the file has grown.
   std::string bytes(static_cast<std::size_t>(status.st_size) + 1, '\0');
   std::size_t size = 0;
   while (size < bytes.size()) {

@@ -10,12 +10,12 @@
 
 namespace tavrel::fleet {
 
-/// Hands out what is at `path`, in the order of names: a folder with all below it, an archive, or a
-/// file, which is taken for a log whatever it is called. In folders, links are not followed.
+/// Hands out what is at `path`, ordered by name: a folder with everything below it, an archive, or
+/// a file, which is taken for a log whatever its name. Does not follow links in folders.
 void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink);
 
-/// The bytes of a regular file of at most `limit` bytes. The error is the reason without the file's
-/// name.
+/// The bytes of a regular file of at most `limit` bytes. The error is the
+/// reason, without the file's name.
 Expected<std::string> readSourceFile(const std::string& path, std::size_t limit, bool mayBeLink);
 
 }  // namespace tavrel::fleet

@@ -47,7 +47,7 @@ bool UploadLines::add(std::string_view line) {
 }
 
 Expected<std::size_t> UploadLines::read(const std::string& path) {
-  // Longer than any line of a server whose headers are bounded.
+  // Longer than any line of a server that bounds its headers.
   constexpr std::size_t kLineBytes = 64U << 10;
   const std::unique_ptr<gzFile_s, Close> file(gzopen(path.c_str(), "rbe"));
   if (!file) return systemError("read", path);

@@ -1,5 +1,5 @@
-// The lines of JSON in which a server that receives uploads notes the metadata of logs, as
-// docs/examples/upload/nginx.conf has them.
+// The lines of JSON in which an upload server notes the metadata of logs, in the format of
+// docs/examples/upload/nginx.conf.
 #pragma once
 
 #include <cstddef>
@@ -15,11 +15,11 @@ namespace tavrel::fleet {
 
 class UploadLines {
  public:
-  /// Adds the lines of a file, which may be in gzip's form. A later line about the same log counts.
-  /// Yields how many lines say nothing of a log that has arrived.
+  /// Adds the lines of a file, which may be compressed with gzip. A later line about the same log
+  /// replaces an earlier one. Returns how many lines do not describe a log that has arrived.
   Expected<std::size_t> read(const std::string& path);
 
-  /// Null when there is no line about the log, whose name ends with ".log".
+  /// Null when no line describes the log, whose name must end with ".log".
   const LogMetadata* find(std::string_view device, std::string_view log) const;
 
  private:

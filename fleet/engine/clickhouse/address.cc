@@ -34,7 +34,7 @@ std::string part(CURLU* url, CURLUPart which, unsigned flags = CURLU_URLDECODE) 
   return CurlText(text).get();
 }
 
-// Names go into statements as they are.
+// Names go into statements unquoted.
 void checkName(const std::string& what, std::string_view name) {
   const auto isPlain = [](char c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';

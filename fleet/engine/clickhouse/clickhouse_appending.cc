@@ -9,11 +9,11 @@
 namespace tavrel::fleet {
 namespace {
 
-// Limits of a portion, which is in memory here and, as blocks, on the server.
+// Limits of a portion, which occupies memory here and, as blocks, on the server.
 constexpr std::size_t kLogsInPortion = 4096;
 constexpr std::size_t kRowsInPortion = 1'000'000;
 
-// A statement may have 256 KiB, unless its settings say otherwise.
+// By default a statement may have 256 KiB.
 constexpr std::size_t kDigestsAtOnce = 1000;
 
 std::string_view bytesOf(const LogRecord& record) {

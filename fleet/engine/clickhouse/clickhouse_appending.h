@@ -1,9 +1,9 @@
 // Files records in the tables of a ClickHouse database.
 //
-// The server has no transactions. A portion's rows get numbers of logs that no other attempt uses,
-// and the rows of table "log" follow last: before them, all the rest belongs to logs that are not
-// filed. An attempt whose outcome is not known is repeated with other numbers. When both succeeded,
-// or two loaders brought the same log, table "log" has its digest twice, and readers take one.
+// The server has no transactions. Each attempt to insert a portion gives its logs new numbers and
+// writes the rows of table "log" last; until then its other rows belong to no filed log. An attempt
+// whose outcome is unknown is repeated. If both succeeded, or two loaders filed the same log, table
+// "log" has its digest twice, and readers use one of them.
 #pragma once
 
 #include <array>
@@ -36,7 +36,7 @@ class ClickhouseAppending {
 
   Server& server_;
   std::random_device random_;
-  std::array<std::set<std::string, std::less<>>, 3> keys_;  // those that are filed, by kind
+  std::array<std::set<std::string, std::less<>>, 3> keys_;  // keys already filed, by kind
   bool keysAreRead_ = false;
 
   // The rows of a portion.

@@ -8,7 +8,7 @@
 
 namespace tavrel::fleet {
 
-/// The address as in address.h. Throws EngineError. With `writes`, missing tables are made.
+/// address.h has the form of the address. With `writes`, makes missing tables. Throws EngineError.
 std::unique_ptr<Engine> openClickhouseEngine(std::string_view address, bool writes);
 
 }  // namespace tavrel::fleet

@@ -14,10 +14,10 @@ namespace {
 
 constexpr std::size_t kRowsAtOnce = 1024;
 
-// Servers make blocks of 65,536 rows, and a row with texts takes some 200 bytes.
+// Servers send blocks of 65,536 rows, and a row with texts takes some 200 bytes.
 constexpr std::size_t kLargestBlock = 256U << 20;
 
-// Hands the rows of a block out. A field is where in a row the value of a column belongs.
+// Hands out the rows of a block. A field selects the member of a row that a column's value fills.
 template <class Row, class... Fields>
 void visitBlock(NativeBlock& block, const Visitor<Row>& visit, const Fields&... fields) {
   std::array<Row, kRowsAtOnce> rows;
@@ -36,7 +36,7 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
   constexpr std::array kTypes = {
       columnTypeOf<std::remove_reference_t<std::invoke_result_t<Fields, Row&>>>()...};
   bytes.clear();
-  std::size_t enough = 1;  // bytes with which it is worth looking for a block
+  std::size_t enough = 1;  // how many bytes make another search worthwhile
   NativeBlock block;
   const auto takeBlocks = [&] {
     std::size_t taken = 0;
@@ -57,7 +57,7 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
                         ": a block of rows has more than 256 MiB: the tables are not those of this "
                         "program; check the address");
     }
-    // As much again, so that a block is not looked through too often.
+    // Wait until the bytes have doubled: searching a partial block too often would be slow.
     enough = 2 * bytes.size() + 1;
   };
   server.ask(statement + " FORMAT Native", [&](std::string_view piece) {

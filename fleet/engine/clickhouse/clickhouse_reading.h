@@ -22,7 +22,7 @@ class ClickhouseReading {
 
  private:
   Server& server_;
-  std::string bytes_;  // of an answer; here to keep its room
+  std::string bytes_;  // of an answer; kept to reuse its memory
 };
 
 }  // namespace tavrel::fleet

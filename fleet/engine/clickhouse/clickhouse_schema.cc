@@ -16,8 +16,8 @@ struct TableForm {
   const char* shard;  // all rows of a log are on one shard
 };
 
-// Keys are texts and not numbers: sorted, they take hardly more room, and nobody has to hand out
-// numbers to several loaders.
+// Keys are texts rather than numbers: sorted, they take hardly more room, and nobody has to
+// coordinate numbers between several loaders.
 constexpr std::array kTables = {
     TableForm{"log",
               "log UInt64, digest FixedString(32), day Int32, created Int64, os_version String, "
@@ -59,8 +59,8 @@ constexpr std::array kViews = {
     ViewForm{"applications", "bundle, version, uuid, orbo_id, arch, log, times", "activation"},
 };
 
-// Of logs that two loaders brought at once the one with the lowest number counts. Rows of logs that
-// are not filed were left by a load that was killed.
+// When two loaders filed the same log at once, the copy with the lowest number counts. The views
+// also hide rows without a filed log, which a killed load left behind.
 void makeViews(Server& server, const std::string& database) {
   for (const ViewForm& view : kViews) {
     server.ask("CREATE VIEW IF NOT EXISTS " + database + "." + view.name + " AS SELECT " +
@@ -78,7 +78,7 @@ void checkVersion(const Server& server, std::string versions) {
                     ": use the program that made them, or load the logs into a new database");
 }
 
-// Empty when the tables were not made, or not to the end.
+// Empty when the tables were never made, or not completely.
 std::string versionsIn(Server& server, const std::string& database) {
   try {
     return server.ask("SELECT DISTINCT version FROM " + database +
@@ -90,7 +90,7 @@ std::string versionsIn(Server& server, const std::string& database) {
   }
 }
 
-// The version is written last, so that tables with one are complete.
+// The version is written last, so tables that have one are complete.
 void makeTables(Server& server, const std::string& database) {
   server.ask("CREATE DATABASE IF NOT EXISTS " + database);
   for (const TableForm& table : kTables) {
@@ -102,7 +102,7 @@ void makeTables(Server& server, const std::string& database) {
              ")");
 }
 
-// One table for those of all servers, under the same name in a database of its own.
+// One table that unites those of all servers, with the same name in another database.
 void makeDistributedTables(Server& server, const std::string& database,
                            const std::string& distributed) {
   server.ask("CREATE DATABASE IF NOT EXISTS " + distributed);

@@ -5,8 +5,8 @@
 
 namespace tavrel::fleet {
 
-/// Makes the server use the database's tables, or those of its cluster, and checks their version.
-/// With `writes`, missing ones are made. Throws EngineError.
+/// Selects the database's tables, or those of its cluster, on the server and checks their version.
+/// With `writes`, makes missing tables. Throws EngineError.
 void openTables(Server& server, bool writes);
 
 }  // namespace tavrel::fleet

@@ -30,7 +30,7 @@ std::string_view takeBytes(std::string_view& bytes, std::uint64_t size) {
   return taken;
 }
 
-/// 0 for texts.
+/// Bytes of a value; 0 for texts, which vary.
 std::size_t widthOf(std::string_view type) {
   if (type == "String") return 0;
   if (type == "UInt8") return 1;
@@ -72,7 +72,7 @@ NativeBlock::Found NativeBlock::find(std::string_view bytes,
 
 void NativeBlock::take(const char*& next, std::string_view& text) {
   constexpr std::size_t kLongestSize = 10;
-  // `find` has seen the whole of it.
+  // `find` has checked that the text is complete.
   std::string_view size(next, kLongestSize);
   const std::uint64_t length = takeSize(size);
   text = {size.data(), static_cast<std::size_t>(length)};

@@ -1,5 +1,5 @@
-// ClickHouse's column format: blocks of rows, each with the values of one column after those of the
-// other. Servers write it in two thirds of the time that they need for rows.
+// ClickHouse's column format: blocks of rows that hold the values column by column. Servers write
+// it in two thirds of the time that the row format takes.
 #pragma once
 
 #include <concepts>
@@ -13,7 +13,7 @@
 
 namespace tavrel::fleet {
 
-/// What a server calls the type of a column.
+/// The server's name for the type of a column.
 template <class Value>
 constexpr std::string_view columnTypeOf() {
   if constexpr (std::same_as<Value, std::uint8_t>) {
@@ -32,19 +32,19 @@ constexpr std::string_view columnTypeOf() {
   }
 }
 
-/// One block at the beginning of bytes that arrive in pieces.
+/// Finds one block at the start of bytes that arrive in pieces.
 class NativeBlock {
  public:
   enum class Found : std::uint8_t {
     kBlock,
-    kPart,   ///< bytes of it are still to come
-    kOther,  ///< columns of other types, or no block
+    kPart,   ///< some of its bytes have not arrived yet
+    kOther,  ///< columns of other types, or not a block
   };
 
   /// Looks for a block with columns of these types. The bytes must stay where they are.
   Found find(std::string_view bytes, std::span<const std::string_view> types);
 
-  // Of the block that was found.
+  // About the block that was found:
   std::size_t size() const { return size_; }
   std::size_t rows() const { return rows_; }
   /// Fills a field of each row with the next values of a column.
@@ -66,7 +66,7 @@ class NativeBlock {
 
   std::size_t rows_ = 0;
   std::size_t size_ = 0;
-  std::vector<const char*> columns_;  // where the next value of each is
+  std::vector<const char*> columns_;  // the next value of each
 };
 
 }  // namespace tavrel::fleet

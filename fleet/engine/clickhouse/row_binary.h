@@ -1,4 +1,4 @@
-// ClickHouse's row format: numbers as they are in memory, texts behind their length.
+// ClickHouse's row format: numbers as they are in memory, each text preceded by its length.
 #pragma once
 
 #include <bit>

@@ -17,11 +17,11 @@ constexpr long kConnectSeconds = 10;
 constexpr std::size_t kLongestComplaint = 65'536;
 constexpr std::size_t kLongestReason = 300;
 constexpr long kReceiveBytes = 512L << 10;
-// Of an answer that the server keeps in memory until it is whole; more goes to a file there.
+// How much of an answer the server buffers in memory; the rest goes to a file there.
 constexpr const char* kAnswerBytes = "33554432";
 
-// Codes of conditions that pass: time exceeded, too many queries, network trouble between servers,
-// too many parts that wait to be merged, no replica or shard reachable.
+// Codes of transient conditions: time exceeded, too many queries, network trouble between servers,
+// too many parts waiting to be merged, no replica or shard reachable.
 constexpr std::array kPassingCodes = {159, 202, 203, 209, 210, 252, 279};
 
 template <class Argument>
@@ -38,7 +38,7 @@ std::string encoded(std::string_view text) {
 }
 
 int codeIn(std::string_view answer) {
-  // A server of a cluster reports another one's missing table among failures to connect.
+  // In a cluster, a server reports another server's missing table as a failure to connect.
   if (answer.find("There is no table") != answer.npos) return ServerError::kUnknownTable;
   constexpr std::string_view kPrefix = "Code: ";
   const std::size_t at = answer.find(kPrefix);
@@ -50,7 +50,7 @@ int codeIn(std::string_view answer) {
   return code;
 }
 
-// The server's sentence, without what surrounds it: "Code: 60, e.displayText() = DB::Exception:
+// Extracts the server's sentence from text such as "Code: 60, e.displayText() = DB::Exception:
 // Table default.x doesn't exist., e.what() = DB::Exception". Empty when another program answered.
 std::string reasonIn(std::string_view answer) {
   constexpr std::string_view kBegin = "Exception: ";
@@ -70,7 +70,7 @@ std::string reasonIn(std::string_view answer) {
 
 }  // namespace
 
-// What the callback of one transfer works with.
+// The context of one transfer's callback.
 struct Server::Transfer {
   CURL* handle;
   const std::function<void(std::string_view)>& take;
@@ -113,7 +113,7 @@ Server::Handle Server::newHandle() const {
   set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
   if (!address_.authorityFile.empty()) {
     set(handle, CURLOPT_CAINFO, address_.authorityFile.c_str());
-    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // not the system's as well
+    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // do not trust the system's as well
   }
   if (!address_.user.empty()) {
     set(handle, CURLOPT_HTTPAUTH, static_cast<long>(CURLAUTH_BASIC));
@@ -128,12 +128,12 @@ Server::Handle Server::newHandle() const {
   return owned;
 }
 
-// With this setting the server sends nothing before the statement has ended. Otherwise it would
-// append a late failure to the rows of a successful answer.
+// With wait_end_of_query the server sends nothing before the statement has ended. Otherwise it
+// would append a late failure to the rows of an answer that began as a success.
 std::string Server::urlWith(const std::string& statement) const {
   std::string url = address_.url + "?wait_end_of_query=1&buffer_size=" + kAnswerBytes;
   if (!database_.empty()) url += "&database=" + database_;
-  // Rows are on all servers of a cluster before the answer says so.
+  // The answer comes only once the rows are on all servers of a cluster.
   if (!address_.cluster.empty()) url += "&insert_distributed_sync=1";
   if (!statement.empty()) url += "&query=" + encoded(statement);
   return url;
@@ -164,8 +164,8 @@ void Server::perform(const std::string& url, std::string_view body, bool isRepea
   set(handle, CURLOPT_POSTFIELDS, body.data());
   set(handle, CURLOPT_WRITEDATA, &transfer);
   set(handle, CURLOPT_ERRORBUFFER, words.data());
-  // On a connection that was used before, libcurl itself sends a request again when it gets no
-  // answer.
+  // On a reused connection, libcurl itself repeats a request that gets no answer, so
+  // rows get a fresh connection.
   set(handle, CURLOPT_FRESH_CONNECT, isRepeatable ? 0L : 1L);
   const CURLcode code = curl_easy_perform(handle);
   if (transfer.failure) std::rethrow_exception(transfer.failure);

@@ -1,4 +1,4 @@
-// A ClickHouse server, asked over HTTP.
+// A ClickHouse server, reached over HTTP.
 #pragma once
 
 #include <cstdint>
@@ -13,16 +13,16 @@
 
 namespace tavrel::fleet {
 
-/// What the server answered to a statement that it did not carry out.
+/// The server refused a statement; the text is its answer.
 struct ServerError : EngineError {
   static constexpr int kUnknownTable = 60;
   static constexpr int kUnknownDatabase = 81;
 
   ServerError(int number, const std::string& text) : EngineError(text), code(number) {}
-  int code;  ///< ClickHouse's own; 0 when the answer has none
+  int code;  ///< ClickHouse's error code; 0 when the answer has none
 };
 
-/// The server was away, too slow, or too busy. Whether it carried the statement out is not known.
+/// The server was unreachable, too slow, or too busy. It may or may not have run the statement.
 struct PassingError : EngineError {
   using EngineError::EngineError;
 };
@@ -33,21 +33,21 @@ class Server {
 
   const ServerAddress& address() const { return address_; }
 
-  /// Statements refer to tables of this database from now on.
+  /// From now on, statements refer to tables of this database.
   void use(std::string database) { database_ = std::move(database); }
 
-  /// Runs a statement and yields its answer.
+  /// Runs a statement and returns its answer.
   std::string ask(std::string_view statement);
 
-  /// Hands the answer out in pieces, once the server has all of it. What `take` throws is passed
-  /// on.
+  /// Hands out the answer in pieces once the server has all of it. Exceptions
+  /// from `take` reach the caller.
   void ask(std::string_view statement, const std::function<void(std::string_view)>& take);
 
-  /// Runs the operation, again after pauses as long as it ends with a PassingError and the address
-  /// allows.
+  /// Runs the operation. As long as it ends with a PassingError, runs it again after a pause, up to
+  /// the number of retries in the address.
   void retry(const std::function<void()>& operation) const;
 
-  /// Sends rows after the statement, which must name a format. Never sends them twice.
+  /// Sends the statement, which must name a format, followed by the rows. Never sends them twice.
   void insert(const std::string& statement, std::string_view rows);
 
  private:

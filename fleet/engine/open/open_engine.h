@@ -1,4 +1,4 @@
-// Opens the database that a text of the command line names.
+// Opens the database that the command line names.
 #pragma once
 
 #include <cstdint>
@@ -11,17 +11,17 @@
 namespace tavrel::fleet {
 
 enum class OpenMode : std::uint8_t {
-  kRead,   ///< the database must be there
-  kWrite,  ///< makes it, or its tables, where they are missing
+  kRead,   ///< the database must exist
+  kWrite,  ///< makes the database or its tables when they are missing
 };
 
-/// What is wrong with the text that names a database, in words; empty when nothing is. Looks at the
-/// text only.
+/// A readable fault in the text that names a database; empty when there is none. Checks only
+/// the text, not the database.
 std::string databaseFault(const std::string& where);
 
 /// `where` is the path of an SQLite file, or the address of a database on a ClickHouse server:
-/// clickhouse://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], clickhouses:// over TLS.
-/// docs/fleet-tables.md has the options. Throws EngineError.
+/// clickhouse://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], or clickhouses:// over
+/// TLS. docs/fleet-tables.md lists the options. Throws EngineError.
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode);
 
 }  // namespace tavrel::fleet

@@ -5,8 +5,8 @@
 namespace tavrel::fleet {
 namespace {
 
-// A block with fewer logs is continued by the next append. Otherwise loaders that append log by log
-// would make a block of each, and every reader has to look into every block.
+// The next append continues a block with fewer logs. Otherwise loaders that append one log at a
+// time would make a block for each, and every reader has to look into every block.
 constexpr std::int64_t kFewLogs = 256;
 
 struct RowTable {

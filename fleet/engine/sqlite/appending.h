@@ -11,7 +11,7 @@
 
 namespace tavrel::fleet {
 
-/// After an operation has thrown, a new object has to take over.
+/// After an operation has thrown, use a new object.
 class Appending {
  public:
   explicit Appending(Connection& connection);
@@ -40,7 +40,7 @@ class Appending {
   std::int64_t block_ = 0;
   std::int64_t firstLog_ = 0;  // of the block
   std::int64_t log_ = 0;       // the next one
-  std::int64_t blockEnd_ = 0;  // the log with which another block begins
+  std::int64_t blockEnd_ = 0;  // the first log of the next block
 };
 
 }  // namespace tavrel::fleet

@@ -1,4 +1,4 @@
-// Ownership of an SQLite connection and its statements. Failures are thrown as EngineError.
+// Owns an SQLite connection and its statements. Failures are thrown as EngineError.
 #pragma once
 
 #include <cstdint>
@@ -18,7 +18,7 @@ class Connection {
   void execute(const char* sql);
   /// The first column of the first row.
   std::int64_t integer(const char* sql);
-  /// The rows that the last statement changed.
+  /// How many rows the last statement changed.
   int changes() const;
 
   sqlite3* handle() const { return handle_.get(); }
@@ -35,7 +35,7 @@ class Connection {
   std::unique_ptr<sqlite3, Close> handle_;
 };
 
-/// Must not outlive its connection. Borrows what is bound until the next reset.
+/// Must not outlive its connection. Bound values must stay valid until the next reset.
 class Statement {
  public:
   Statement(const Connection& connection, std::string_view sql);
@@ -45,9 +45,9 @@ class Statement {
   void bind(int index, std::string_view text);
   void bindBlob(int index, std::string_view bytes);
 
-  /// True with a row, false at the end.
+  /// True when there is a row, false at the end.
   bool step();
-  /// Bindings stay.
+  /// Keeps the bindings.
   void reset();
   /// Runs to the end and resets.
   void run();

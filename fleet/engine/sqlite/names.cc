@@ -18,7 +18,7 @@ constexpr const char* kAddApplication =
     "INSERT INTO application(id, bundle, version, uuid, orbo_id, arch) "
     "VALUES(?1, ?2, ?3, ?4, ?5, ?6)";
 
-// One text for a tuple: no two tuples have the same, as each part but the last has its length.
+// Encodes a tuple as one text. Each part but the last has its length, so no two tuples collide.
 void join(std::string& out, std::int64_t number) {
   out.append(reinterpret_cast<const char*>(&number), sizeof number);
 }

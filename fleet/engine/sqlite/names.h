@@ -17,8 +17,8 @@
 
 namespace tavrel::fleet {
 
-/// From texts to numbers, in memory. Logs mostly have the same texts in the same order, so that
-/// each entry remembers which one was asked for after it.
+/// Maps texts to numbers, in memory. Logs mostly have the same texts in the same order, so each
+/// entry remembers which one was looked up after it.
 class Dictionary {
  public:
   std::optional<std::int64_t> find(std::string_view text);
@@ -37,8 +37,8 @@ class Dictionary {
   std::size_t last_ = 0;
 };
 
-/// To be used inside a write transaction, after `refresh`; what a transaction added counts only
-/// when it is committed, so after a rollback a new object has to take over.
+/// Use it only inside a write transaction and after `refresh`. After a rollback, use a new object:
+/// this one remembers numbers that were never committed.
 class Names {
  public:
   explicit Names(const Connection& connection);
@@ -59,7 +59,7 @@ class Names {
     /// The number for the next name of the table.
     std::int64_t next(const Connection& connection);
 
-    Statement news;  ///< the rows above ?1: id, the texts that a name consists of
+    Statement news;  ///< the rows above ?1: the id, then the texts of the name
     Statement addition;
     std::int64_t highest = 0;
   };

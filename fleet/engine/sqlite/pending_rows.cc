@@ -16,8 +16,8 @@ struct Cursor : sqlite3_vtab_cursor {
   RowSource* source;
 };
 
-// SQLite calls what follows. No exception may pass through it: it would leave its connection in the
-// middle of something.
+// SQLite calls the functions below. No exception may pass through it: that would leave its
+// connection in an undefined state.
 
 RowSource& sourceOf(sqlite3_vtab_cursor* cursor) {
   return *static_cast<Cursor*>(cursor)->source;
@@ -84,7 +84,7 @@ int rowId(sqlite3_vtab_cursor* cursor, sqlite3_int64* out) {
   return SQLITE_OK;
 }
 
-// Without functions to create and destroy it, a module is a table of its own name.
+// A module without functions to create and destroy it is itself a table, of the same name.
 constexpr sqlite3_module kModule = [] {
   sqlite3_module module{};
   module.xConnect = connect;

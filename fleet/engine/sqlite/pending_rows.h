@@ -1,7 +1,7 @@
-// The rows that wait for being inserted, and a virtual table that hands them to SQLite.
+// Rows that wait to be inserted, and a virtual table that hands them to SQLite.
 //
-// One INSERT … SELECT from a virtual table takes about half the time of a statement that is bound
-// and run for each row.
+// One INSERT … SELECT from a virtual table takes about half the time of binding and running
+// a statement for each row.
 #pragma once
 
 #include <cstddef>
@@ -16,7 +16,7 @@ struct sqlite3_context;
 
 namespace tavrel::fleet {
 
-/// Rows in the order of their identifiers, which one statement walks at a time.
+/// Rows in the order of their identifiers. Only one statement at a time may walk them.
 class RowSource {
  public:
   virtual ~RowSource() = default;
@@ -25,19 +25,19 @@ class RowSource {
   virtual bool atEnd() const = 0;
   virtual void next() = 0;
   virtual std::int64_t id() const = 0;
-  /// Sets the result to the value of a column, from 1 on.
+  /// Sets the result to the value of a column, counted from 1.
   virtual void value(sqlite3_context* result, int column) const = 0;
 };
 
-/// Makes a table `name` of the columns id, a, b, c, d and e, whose rows are those of the source.
-/// The source must outlive every statement that reads the table; a later source of the same name
-/// replaces it.
+/// Makes a table `name` with the columns id, a, b, c, d and e, whose rows are those of the source.
+/// The source must outlive every statement that reads the table. Adding another source under the
+/// same name replaces this one.
 void addRowTable(const Connection& connection, const char* name, RowSource& source);
 
 void setResult(sqlite3_context* result, std::int64_t value, int column);
 void setResult(sqlite3_context* result, const FiveNumbers* numbers, int column);
 
-/// The rows of one block in one table, grouped by the number of their name.
+/// Rows for one block of one table, grouped by the number of their name.
 template <class Payload>
 class PendingRows : public RowSource {
  public:
@@ -46,7 +46,7 @@ class PendingRows : public RowSource {
     Payload payload;
   };
 
-  /// Places of a name must ascend.
+  /// The places of a name must ascend.
   void add(std::int64_t name, std::int64_t place, Payload payload) {
     const auto index = static_cast<std::size_t>(name);
     if (index >= names_.size()) names_.resize(index + index / 2 + 1);

@@ -33,7 +33,7 @@ class Batch {
   std::size_t count_ = 0;
 };
 
-// What one statement after another reads inside is of one moment.
+// All statements within it see the database as of one moment.
 class ReadTransaction {
  public:
   explicit ReadTransaction(Connection& connection) : connection_(connection) {
@@ -43,7 +43,7 @@ class ReadTransaction {
     try {
       connection_.execute("COMMIT");
     } catch (const EngineError&) {
-      // It has ended by itself.
+      // A failure has already ended the transaction.
     }
   }
   ReadTransaction(const ReadTransaction&) = delete;
@@ -53,8 +53,8 @@ class ReadTransaction {
   Connection& connection_;
 };
 
-// An aggregate function that is called for each row: a third faster than a step of the statement
-// for each, as fast as the engine's own sum.
+// An aggregate function that is called for each row: a third faster than stepping the statement row
+// by row, and as fast as SQLite's own sum.
 void takeRow(sqlite3_context* context, int, sqlite3_value** values) {
   auto& taking = *static_cast<Reading::Taking*>(sqlite3_user_data(context));
   try {

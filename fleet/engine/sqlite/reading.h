@@ -26,7 +26,7 @@ class Reading {
   void distributions(std::string_view key, const Visitor<DistributionValue>& visit);
   void cells(std::string_view key, const Visitor<CellValue>& visit);
 
-  /// What SQLite's functions work with.
+  /// The context of the SQL function that receives the rows.
   struct Taking {
     std::function<void(sqlite3_value** values)> take;
     std::exception_ptr failure;
@@ -38,11 +38,11 @@ class Reading {
     std::int64_t firstLog = 0;
   };
 
-  /// The number of a key, 0 when there is none.
+  /// The number of a key; 0 when there is none.
   std::int64_t find(KeyKind kind, std::string_view key);
   void refreshBlocks();
 
-  /// Hands out all rows of a name. `make` makes one of a log and the row's values.
+  /// Hands out all rows of a name. `make` builds a row from its log and its SQL values.
   template <class Row, class Make>
   void visitRows(Statement& statement, std::int64_t name, const Visitor<Row>& visit,
                  const Make& make);

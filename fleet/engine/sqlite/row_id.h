@@ -2,8 +2,8 @@
 //
 // SQLite keeps a table in the order of its 64-bit row identifiers. Here they consist of the number
 // of a block of logs (24 bits), that of a name (25 bits) and the place of the log in the block (14
-// bits). So the rows that one loader appends go to the end of their table, which costs less than
-// half of filing them elsewhere, and in each block the rows of one name lie together.
+// bits). The rows that one loader appends thus go to the end of their table, which costs less than
+// half of inserting them elsewhere, and within a block the rows of a name lie together.
 #pragma once
 
 #include <cstdint>

@@ -19,7 +19,7 @@ constexpr const char* kReadVersion = "PRAGMA user_version";
 
 static_assert(kPlaceBits == 14 && kNameBits == 25, "the views below compute with these numbers");
 
-// `id` of the four tables of rows: see row_id.h. Columns without a type hold doubles: see real.h.
+// For `id` in the four tables of rows, see row_id.h; for columns without a type (doubles), real.h.
 constexpr const char* kTables = R"(
 CREATE TABLE log(id INTEGER PRIMARY KEY, digest BLOB NOT NULL UNIQUE, day INTEGER NOT NULL,
   created INTEGER NOT NULL, os_version TEXT NOT NULL, previous_os_version TEXT NOT NULL,
@@ -83,8 +83,8 @@ void checkVersion(const std::string& path, std::int64_t version) {
                     ": use the program that made it, or load the logs into a new file");
 }
 
-// Reads the file's header as bytes: SQLite would complete or undo the changes of another program's
-// file while it opens it.
+// Reads the file's header as bytes: merely by opening another program's file, SQLite would complete
+// or roll back its changes.
 Found look(const std::string& path) {
   std::array<unsigned char, 100> header{};
   errno = 0;
@@ -107,7 +107,7 @@ Found look(const std::string& path) {
   return Found::kDatabase;
 }
 
-// The first transaction goes without a write-ahead log, so that the header is in the file itself.
+// The first transaction uses no write-ahead log, so that the header gets into the file itself.
 void createTables(Connection& connection) {
   connection.execute("PRAGMA page_size = 8192");
   WriteTransaction transaction(connection);
@@ -125,8 +125,8 @@ Connection openFile(const std::string& path, bool writes) {
   const std::string nothing = path + ": there is no database: load logs into it first";
   if (look(path) == Found::kNothing && !writes) throw EngineError(nothing);
   Connection connection(path, writes);
-  // A program that was killed while it made the tables left a file with a header, of which SQLite
-  // makes an empty one when it opens it.
+  // A program that was killed while it made the tables left a file with a header; SQLite rolls such
+  // a file back to an empty one when it opens it.
   std::int64_t version = connection.integer(kReadVersion);
   if (version == 0 && writes) {
     createTables(connection);

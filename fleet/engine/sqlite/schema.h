@@ -1,4 +1,4 @@
-// The tables of an SQLite file, and opening a file that has them.
+// The tables of an SQLite file, and how a file that has them is opened.
 #pragma once
 
 #include <string>
@@ -7,8 +7,8 @@
 
 namespace tavrel::fleet {
 
-/// Throws EngineError for a file that is not this program's, or of another version, before anything
-/// touches it. With `writes`, an absent or empty file gets the tables.
+/// Throws EngineError, before anything touches the file, when it belongs to another program or
+/// version. With `writes`, an absent or empty file gets the tables.
 Connection openFile(const std::string& path, bool writes);
 
 }  // namespace tavrel::fleet

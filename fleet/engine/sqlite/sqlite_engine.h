@@ -8,8 +8,8 @@
 
 namespace tavrel::fleet {
 
-/// Throws EngineError. With `writes`, an absent or empty file becomes a database; without, the file
-/// is opened for reading only. A file that is no database of this program stays as it is.
+/// Throws EngineError. With `writes`, an absent or empty file becomes a database; otherwise the
+/// file is opened read-only. A file that is not a database of this program is left unchanged.
 std::unique_ptr<Engine> openSqliteEngine(const std::string& path, bool writes);
 
 }  // namespace tavrel::fleet
