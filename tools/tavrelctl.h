@@ -8,8 +8,8 @@
 
 namespace tavrel {
 
-/// Runs one command line, without the program's name, and yields the exit status: 0 for success, 1
-/// for failure, 2 for wrong usage. Nothing is thrown.
+/// Runs one command line, given without the program's name, and returns the exit status: 0 for
+/// success, 1 for failure, 2 for wrong usage. Throws nothing.
 int runTavrelctl(const std::vector<std::string>& arguments, const ToolStreams& streams);
 
 }  // namespace tavrel

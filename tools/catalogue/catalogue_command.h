@@ -1,4 +1,4 @@
-// `tavrelctl catalogue`: what figures mean.
+// `tavrelctl catalogue`: explains what figures mean.
 #pragma once
 
 #include "tools/shared/tool_context.h"

@@ -1,4 +1,4 @@
-// What is looked at to tell whether a device is well, and how it was found.
+// The checks that show whether a device is well, and their results.
 #pragma once
 
 #include <chrono>
@@ -11,19 +11,19 @@
 
 namespace tavrel {
 
-/// The values are exit statuses, as monitoring plugins have them.
+/// The values are exit statuses, following the convention of monitoring plugins.
 enum class CheckState : std::uint8_t { Ok = 0, Warning = 1, Critical = 2, Unknown = 3 };
 
 /// "OK", "WARNING", "CRITICAL", "UNKNOWN".
 std::string_view nameOf(CheckState state);
-/// The graver one: what is critical weighs most, then warnings, then what is unknown.
+/// The graver state: critical outweighs warning, and warning outweighs unknown.
 CheckState graver(CheckState a, CheckState b);
 
-/// A figure that a check looks at, in JSON and as a metric.
+/// A figure of a check, in JSON and as a metric.
 struct CheckFigureKind {
-  std::string_view name;    // of the member in JSON
-  std::string_view metric;  // of the metric family
-  std::string_view unit;    // at the metric's end; empty when it has none
+  std::string_view name;    // the member in JSON
+  std::string_view metric;  // the metric family
+  std::string_view unit;    // at the end of the metric's name; empty without one
   std::string_view help;
 };
 
@@ -34,21 +34,21 @@ struct CheckFigure {
 
 struct Check {
   std::string_view name;     // "queue"
-  std::string subject = {};  // "pending"; empty where there is only one
+  std::string subject = {};  // "pending"; empty when there is only one
   CheckState state = CheckState::Ok;
-  std::string text = {};  // on one line
+  std::string text = {};  // one line
   std::vector<CheckFigure> figures = {};
 };
 
-/// Ages beyond which something that should happen each day has not happened, in seconds. Every
-/// check of an age has these two thresholds.
+/// When something that should happen each day is this old, in seconds, it has stopped happening.
+/// All checks of an age use these two thresholds.
 inline constexpr std::int64_t kWarningAge = std::int64_t{2} * 86'400;
 inline constexpr std::int64_t kCriticalAge = std::int64_t{7} * 86'400;
 
 CheckState stateOfAge(std::int64_t seconds);
 
-/// Looks at everything, in the order in which it is shown. Changes nothing. `examination`: how long
-/// the store's file may be looked through for damage.
+/// Runs all checks, in the order in which they are shown. Changes nothing. `examination` limits how
+/// long the store's file is searched for damage.
 std::vector<Check> checkDevice(ToolContext& context, std::chrono::milliseconds examination);
 
 /// Prints a line for each check and sets the exit status to the gravest state.

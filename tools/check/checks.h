@@ -1,4 +1,4 @@
-// The checks, by what they look at. Each adds one or more to the list.
+// The checks, grouped by subject. Each function adds one or more checks to the list.
 #pragma once
 
 #include <optional>
@@ -24,7 +24,7 @@ struct CheckScene {
 
 std::int64_t secondsOf(plist::Date date);
 
-/// Makes a check at least as grave as `state`, and adds to its text, which stays on one line.
+/// Makes a check at least as grave as `state` and extends its text, which stays on one line.
 void addFinding(Check& check, CheckState state, std::string_view text);
 
 void checkPermission(CheckScene& scene);
@@ -32,7 +32,7 @@ void checkClock(CheckScene& scene);
 void checkLastRun(CheckScene& scene);
 void checkLastLog(CheckScene& scene);
 void checkStore(CheckScene& scene);
-/// Limits that were reached, values that were lost, and whether folds are behind.
+/// Limits that were reached, values that were lost, and whether folding is behind.
 void checkRecording(CheckScene& scene);
 void checkQueues(CheckScene& scene);
 void checkUpload(CheckScene& scene);

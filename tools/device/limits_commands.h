@@ -1,5 +1,5 @@
-// tavrelctl limits: what the device holds, beside its limits. tavrelctl tidy: removes what exceeds
-// them.
+// tavrelctl limits: compares what the device holds with its limits. tavrelctl tidy:
+// removes whatever exceeds them.
 #pragma once
 
 #include "tools/shared/tool_context.h"

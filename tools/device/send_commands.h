@@ -12,8 +12,8 @@ namespace tavrel {
 void addSendCommands(Command app, ToolContext& context);
 void addNotifyCommands(Command app, ToolContext& context);
 
-/// The "app_data" of a delivery: `applications` as they are written in a file, checked. The error
-/// names the element and the entry that is wrong.
+/// Checks `applications`, as written in a file, and returns them as the "app_data" of a delivery.
+/// The error names the element and the entry that is wrong.
 Expected<plist::Array> appDataOf(const plist::Value& applications);
 
 }  // namespace tavrel

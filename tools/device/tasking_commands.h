@@ -1,4 +1,4 @@
-// tavrelctl tasking: the scheduled and the applied tasking.
+// tavrelctl tasking: the scheduled tasking and the applied one.
 #pragma once
 
 #include "tools/shared/tool_context.h"

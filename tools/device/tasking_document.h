@@ -5,8 +5,8 @@
 //    "TaskingPayload": [
 //      {"Domain": "com.norvane.da", "Key": "AggressiveSubmissionDays", "Value": 3}]}
 //
-// TaskingDigest may be any value, and may be absent. Without TaskingPayload the device undoes what
-// it applied before and applies nothing.
+// TaskingDigest may be any value, and may be absent. Without TaskingPayload, the device reverts
+// what it applied before and applies nothing new.
 #pragma once
 
 #include <string>
@@ -17,7 +17,7 @@
 namespace tavrel {
 
 /// The reasons why a device would not apply the tasking as written, one line each, such as
-/// "TaskingPayload[3]/Domain: is missing". Empty for a good tasking.
+/// "TaskingPayload[3]/Domain: is missing". Empty for a valid tasking.
 std::vector<std::string> checkTasking(const plist::Value& tasking);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The drives of the device with what is known of their health.
+// The device's drives, with what is known about their health.
 #pragma once
 
 #include <cstdint>
@@ -19,10 +19,10 @@ struct Disk {
 
 struct DiskList {
   std::vector<Disk> disks;    // by kind
-  std::vector<Error> faults;  // of files that are not readings, and of the search for drives
+  std::vector<Error> faults;  // for files that are not readings, and for the search for drives
 };
 
-/// Every drive of the machine, and those that only have a reading.
+/// Every drive of the machine, plus drives that only have a reading.
 DiskList findDisks(ToolContext& context);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// tavrelctl export: figures in the forms of other programs.
+// tavrelctl export: prints figures in the formats of other programs.
 #pragma once
 
 #include "tools/shared/tool_context.h"

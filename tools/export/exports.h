@@ -1,4 +1,4 @@
-// The figures of a page of metrics, by where they come from.
+// The figures on a page of metrics, grouped by source.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +9,7 @@
 
 namespace tavrel {
 
-/// Statistics of one day; without it of the latest that the store has, up to today.
+/// Statistics of one day; without `day`, of the latest in the store, up to today.
 void exportStatistics(ToolContext& context, std::optional<std::int32_t> day, MetricPage& page);
 
 /// The report channels that drivers publish, except for the health of drives.
@@ -18,7 +18,7 @@ void exportChannels(ToolContext& context, MetricPage& page);
 /// The health of drives.
 void exportDisks(ToolContext& context, MetricPage& page);
 
-/// What `status --check` looks at.
+/// The checks of `status --check`.
 void exportChecks(ToolContext& context, MetricPage& page);
 
 }  // namespace tavrel

@@ -1,12 +1,12 @@
-// A page of metrics that is both OpenMetrics text and Prometheus' own text format.
+// A page of metrics that is valid both as OpenMetrics text and in Prometheus' own text format.
 //
 //   MetricPage page;
 //   page.gauge({"tavrel_store_size_bytes", "bytes", "Size of the store."}, {}, 4096);
 //   out << page.text();
 //
-// Families come in the order of their names, metrics in that of their labels, so that equal figures
-// give equal bytes. The two formats disagree on counters, so there are none: what counts is a gauge
-// that grows.
+// Families are sorted by name and metrics by label, so that equal figures give equal
+// bytes. The two formats disagree on counters, so there are none: a count is
+// exported as a gauge that grows.
 #pragma once
 
 #include <cstddef>
@@ -20,7 +20,7 @@
 
 namespace tavrel {
 
-/// A family of metrics. The name ends with the unit, when there is one.
+/// A family of metrics. The name ends with the unit, if there is one.
 struct MetricFamily {
   std::string name;
   std::string_view unit;
@@ -30,9 +30,9 @@ struct MetricFamily {
 /// Names and values. Values may be any bytes.
 using MetricLabels = std::vector<std::pair<std::string_view, std::string>>;
 
-/// Any bytes as the value of a label: a control character, a byte that is not UTF-8 and "%" become
-/// "%" and two hexadecimal digits. A value of more than `kLongestLabel` bytes is cut and ends with
-/// "%~" and 16 digits of the SHA-256 of all bytes. Different bytes give different values.
+/// Encodes any bytes as the value of a label: control characters, bytes that are not UTF-8 and "%"
+/// become "%" and two hexadecimal digits. Cuts values of more than `kLongestLabel` bytes and
+/// appends "%~" and 16 digits of the SHA-256 of all bytes. Different bytes give different values.
 std::string labelValue(std::string_view bytes);
 inline constexpr std::size_t kLongestLabel = 256;
 
@@ -43,24 +43,24 @@ struct SummaryPoint {
 };
 
 struct HistogramPoint {
-  /// Upper bounds, ascending, and how many values are not above them. The last bound is infinity.
+  /// Upper bounds, ascending, and how many values do not exceed each. The last bound is infinity.
   std::vector<std::pair<double, std::uint64_t>> buckets;
   std::optional<double> sum;
 };
 
 class MetricPage {
  public:
-  /// Metrics of one family. Further ones are left out.
+  /// How many metrics a family may have; further ones are left out.
   static constexpr std::size_t kMetrics = 20'000;
 
   void gauge(const MetricFamily& family, const MetricLabels& labels, double value);
-  /// Exact beyond 2^53.
+  /// Exact even beyond 2^53.
   void gauge(const MetricFamily& family, const MetricLabels& labels, std::int64_t value);
   void summary(const MetricFamily& family, const MetricLabels& labels, const SummaryPoint& point);
   void histogram(const MetricFamily& family, const MetricLabels& labels,
                  const HistogramPoint& point);
 
-  /// Metrics that were left out: a family had too many, or two had the same labels.
+  /// Metrics left out because their family had too many, or because two had the same labels.
   std::uint64_t leftOut() const { return leftOut_; }
 
   std::string text() const;

@@ -1,4 +1,4 @@
-// Lists the logs that were filed for submission.
+// Lists the logs filed for submission.
 #pragma once
 
 #include <functional>
@@ -21,31 +21,31 @@ struct FiledLog : FileSubmission::FiledLog {
 /// "pending", "outbox" or "withheld".
 std::string_view nameOf(FileSubmission::Place place);
 
-/// The name of its file, with the ending.
+/// The name of its file, with the extension.
 std::string fileNameOf(const FiledLog& log);
 
 struct FiledLogs {
   std::vector<FiledLog> logs;        // oldest first
-  std::size_t older = 0;             // that were left out
-  std::optional<Error> unseen = {};  // why those that are withheld cannot be seen
+  std::size_t older = 0;             // older logs that were left out
+  std::optional<Error> unseen = {};  // why withheld logs cannot be seen
 };
 
-/// The newest logs of all folders, at most so many, chosen by the names of their files: only the
-/// metadata of those is read.
+/// The newest logs of all folders, at most `most`, chosen by file name:
+/// metadata is read only for these.
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
 
-/// The logs of all folders whose names begin so, oldest first.
+/// The logs of all folders whose names begin with `name`, oldest first.
 Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name);
 
-/// The newest log whose name begins with `namePrefix` and that `accepts` takes. It is chosen by
-/// file names, so few metadata files are read. Nothing when there is none.
+/// The newest log whose name begins with `namePrefix` and that `accepts` takes; nothing when there
+/// is none. The choice goes by file names, so few metadata files are read.
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts);
 
-/// The filed log that `name` means: its path, or the name of its file with or without the ending.
+/// The filed log that `name` identifies: its path, or its file name with or without the extension.
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);
 
-/// Says once why logs stand without metadata. It is a failure when that cannot be read.
+/// Says once why logs lack metadata. A failure when metadata exists but cannot be read.
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs);
 
 }  // namespace tavrel

@@ -1,5 +1,5 @@
-// What is known of the daily log without making one: what prevents the next one, or what became of
-// the last.
+// What is known about the daily log without making one: what prevents the next one,
+// or the outcome of the last.
 #pragma once
 
 #include <cstdint>
@@ -16,15 +16,15 @@ struct WhitelistState {
   bool isMissing = false;
   bool isClosed = false;  // to this user
   bool isUsable = true;   // the daemon can read it
-  std::string fault;      // what is wrong with it, where, and what to do; empty for a good one
+  std::string fault;      // what is wrong, where, and what to do; empty for a valid one
 };
 
 WhitelistState whitelistState(ToolContext& context);
 
 struct LogConclusion {
-  bool isOfNextRun = false;           // otherwise of the last gated one
+  bool isOfNextRun = false;           // otherwise of the last gated run
   std::optional<std::int32_t> day;    // nothing before the first run
-  std::optional<LogOutcome> outcome;  // nothing when it is not known
+  std::optional<LogOutcome> outcome;  // nothing when unknown
   SubmissionPermission permission;
   WhitelistState whitelist;
 

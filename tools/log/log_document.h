@@ -12,22 +12,22 @@
 
 namespace tavrel {
 
-/// What surrounds a log: its place, and the submission service's metadata.
+/// A log's surroundings: its place, and the metadata of the submission service.
 struct LogEnvelope {
   std::string place;  // "pending", "outbox", "preview" or "file"
   std::string path;   // empty for a preview
   plist::Dictionary metadata;
 };
 
-/// The table form: header, metadata, scalars, distributions, histograms as bars, and what is not as
-/// a tallied log has it. `document` is the log when it is a property list.
+/// Prints a table: header, metadata, scalars, distributions, histograms as bars, and whatever does
+/// not belong in a tallied log. `document` is the log when it is a property list.
 void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictionary& document);
 
-/// The same facts. The standard deviation is that of the population: the root of the sum of squared
-/// deviations divided by the count.
+/// The same facts as JSON. The standard deviation is that of the population: the root of the sum of
+/// squared deviations divided by the count.
 Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document);
 
-/// The lines of a log's envelope, which also stand before logs of other forms.
+/// The lines about a log's surroundings, also printed above logs in other formats.
 void printEnvelope(const Page& page, const LogEnvelope& envelope);
 Json jsonOfEnvelope(const LogEnvelope& envelope);
 

@@ -8,11 +8,11 @@
 
 namespace tavrel {
 
-/// Whether a property list is meant to be a tallied log: a dictionary with a log's main entries.
+/// Whether a property list is meant as a tallied log: a dictionary with a log's main entries.
 bool isTalliedLog(const plist::Value& document);
 
-/// Members of a wrong kind or without a meaning, such as "BHScalars: is a string, not a
-/// dictionary", ordered by place. Empty for a good log.
+/// Members that have the wrong type or are unknown, such as "BHScalars: is a string, not a
+/// dictionary", ordered by place. Empty for a valid log.
 std::vector<std::string> faultsOf(const plist::Dictionary& log);
 
 }  // namespace tavrel

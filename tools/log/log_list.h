@@ -1,4 +1,4 @@
-// The list of filed logs, and logs by the beginning of their names.
+// The list of filed logs, and the lookup of a log by the beginning of its name.
 #pragma once
 
 #include <cstddef>
@@ -10,12 +10,12 @@
 
 namespace tavrel {
 
-/// Prints the newest logs of both folders, at most so many, oldest first, with the day that each
-/// reports.
+/// Prints the newest logs of all folders, at most `most`, oldest first, with the
+/// day that each log reports.
 void listLogs(ToolContext& context, std::size_t most);
 
-/// The one filed log whose name begins with `name`. When there is none, a file of this machine, or
-/// standard input for "-". When there are several, the error says how many.
+/// The only filed log whose name begins with `name`; when there is none, a file of this machine, or
+/// standard input for "-". When several match, the error says how many.
 Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The log of a day, made by the daemon's own code without changing anything.
+// The log of a day, made by the daemon's own code but without changing anything.
 #pragma once
 
 #include <cstdint>
@@ -15,14 +15,14 @@
 namespace tavrel {
 
 struct LogPreview {
-  std::optional<CapturedLog> log;   // permission given or not; nothing when none would be made
+  std::optional<CapturedLog> log;   // whether permitted or not; nothing when none would be made
   std::string reason;               // why there is none
-  bool lacksWhitelist = false;      // that is the reason
-  std::vector<std::string> errors;  // that making it logged; the log may then lack something
+  bool lacksWhitelist = false;      // whether that is the reason
+  std::vector<std::string> errors;  // logged while it was made; the log may then be incomplete
   std::string osVersion;
 };
 
-/// `onLine`, when given, takes each line for the system log.
+/// `onLine`, when given, receives each line meant for the system log.
 LogPreview previewLog(
     ToolContext& context, std::int32_t day,
     const std::function<void(std::string_view level, std::string_view message)>& onLine = {});

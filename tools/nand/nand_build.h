@@ -1,12 +1,12 @@
-// Statistics buffers from JSON.
+// Builds statistics buffers from JSON.
 //
-// docs/nand.md describes the form. In short, an object whose "entries" are
+// docs/nand.md describes the format. In short, it is an object whose "entries" are
 //
 //   ["hostWrites", 7]                a statistic by name or number, with a value
 //   ["ECBins", [1, 2]]               with values
 //   ["ECBins0", 1], ["ECBins1", 2]   the same, as `nand parse --json` prints it
-//   {"key": 54, "count": 9, "values": []}   a record whose header says what it likes
-//   {"hex": "00 ff"}                 bytes as they are
+//   {"key": 54, "count": 9, "values": []}   a record with any header, even a wrong one
+//   {"hex": "00 ff"}                 raw bytes
 #pragma once
 
 #include <string>
@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// Yields the bytes of the buffer. The error says which entry is wrong.
+/// Returns the bytes of the buffer. The error names the entry that is wrong.
 Expected<std::string> buildStatistics(const plist::Value& document);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// What follows from several figures of the NAND information.
+// Figures derived from several figures of the NAND information.
 #pragma once
 
 #include <cstddef>
@@ -14,7 +14,7 @@
 
 namespace tavrel {
 
-/// Nothing where a figure is missing or negative, a divisor is 0, or a size exceeds 64 bits.
+/// No value when a figure is missing or negative, a divisor is 0, or a size exceeds 64 bits.
 struct NandDerived {
   explicit NandDerived(const plist::Dictionary& info);
 
@@ -26,7 +26,7 @@ struct NandDerived {
   std::optional<double> freeNodesShare;
   std::optional<double> writeAmplification;  // bytes of erased virtual blocks / logical writes
   std::optional<CivilDate> formattedFrom;    // first day of the week of formatting
-  /// Figures that are 0, except those of a histogram that is not empty.
+  /// Figures that are 0, not counting those of a histogram that is not empty.
   std::size_t zeros = 0;
 };
 
@@ -36,14 +36,14 @@ struct NandBucket {
   std::uint64_t count;
 };
 
-/// By stem, in the order of their numbers: keys that have one stem and differ in three or more
-/// numbers after it. Keys lack the common prefix and are borrowed from the dictionary.
+/// Keys that share a stem and end in three or more different numbers, by stem and in numerical
+/// order. Keys lack the common prefix and are borrowed from the dictionary.
 std::map<std::string_view, std::vector<NandBucket>> nandHistograms(const plist::Dictionary& info);
 
-/// The figure of that key, given without the common prefix; nothing when it is negative.
+/// The figure of `key`, given without the common prefix; nothing when it is missing or negative.
 std::optional<std::uint64_t> nandFigure(const plist::Dictionary& info, std::string_view key);
 
-/// Unknown values are null. Shares are fractions of 1.
+/// Unknown values become null. Shares are fractions of 1.
 Json jsonOf(const NandDerived& derived);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The storage controller's timeline as text, and stack snapshots that a command line names.
+// The storage controller's timeline as text, and stack snapshots given on a command line.
 #pragma once
 
 #include <optional>
@@ -9,11 +9,11 @@
 
 namespace tavrel {
 
-/// The whole text of snapshot records, of the fixed layout or as their descriptor says. The error
-/// says why a descriptor was refused.
+/// The whole text of snapshot records, in the fixed layout or as their descriptor defines. The
+/// error says why the descriptor was refused, or that the text is too long.
 Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor);
 
-/// Yields one given snapshot again and again. The bytes are borrowed.
+/// Returns the one given snapshot every time. The bytes are borrowed.
 class TakenSnapshot final : public StackSnapshots {
  public:
   explicit TakenSnapshot(ByteSpan bytes) : bytes_(bytes) {}

@@ -1,4 +1,4 @@
-// Shows a parsed statistics buffer, or the differences of two, to people and programs.
+// Shows a parsed statistics buffer, or the differences between two, to people and programs.
 #pragma once
 
 #include <cstdint>
@@ -15,26 +15,26 @@
 namespace tavrel {
 
 /// {"result": …, "fields": {…}, "entries": [[name, value], …]}, with every record of the buffer up
-/// to the first broken one: `nand build` makes the same bytes from it.
+/// to the first broken one. `nand build` turns this into the same bytes.
 void printStatisticsJson(std::ostream& out, int result, const ASPContext& context, ByteSpan buffer);
 
 /// One line per statistic, in the order of the buffer. Returns how many records are not listed, or
-/// not completely: those of unknown statistics, without values, or with too many.
+/// only in part: those of unknown statistics, without values, or with too many.
 std::size_t printStatistics(const Page& page, const ASPContext& context, ByteSpan buffer);
 
-/// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for a good buffer.
+/// Why a buffer cannot be parsed: "the record at byte 16: …". Nothing for a valid buffer.
 std::optional<std::string> faultOfStatistics(ByteSpan buffer);
 
-/// A statistic whose value differs, or that only one of two buffers has. The name is borrowed from
-/// a context.
+/// A statistic whose value differs, or that only one of the two buffers has. The name
+/// is borrowed from a context.
 struct StatisticDifference {
   std::string_view name;
   std::optional<std::uint64_t> before;
   std::optional<std::uint64_t> after;
 };
 
-/// In the order of the first buffer, then those that only the second has. When a name occurs
-/// several times, the first is compared with the first, the second with the second.
+/// In the order of the first buffer, followed by those that only the second has. When a name occurs
+/// several times, the first occurrences are compared, then the second ones, and so on.
 std::vector<StatisticDifference> differencesBetween(const ASPContext& before,
                                                     const ASPContext& after);
 

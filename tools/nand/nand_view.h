@@ -6,9 +6,9 @@
 
 namespace tavrel {
 
-/// The content of the dictionary, in groups; keys without their common prefix. The last group has
-/// what belongs to no other. Figures computed from several others (capacity, write amplification)
-/// say from which. Without `showsZeros`, one line counts the figures that are 0.
+/// Prints the dictionary in groups; keys lack their common prefix. The last group has whatever
+/// belongs to no other. Figures computed from several others (capacity, write amplification) name
+/// these. Without `showsZeros`, one line counts the figures that are 0.
 void printNandInfo(const Page& page, const plist::Dictionary& info, bool showsZeros);
 
 }  // namespace tavrel

@@ -8,8 +8,8 @@
 
 namespace tavrel {
 
-/// Services and connections go through to `below`: recorded drivers change nothing on disk. Objects
-/// from it may outlive neither `below` nor `events`.
+/// Services and connections pass through to `below`, since recorded drivers change nothing on disk.
+/// The objects that this returns must not outlive `below` or `events`.
 class OverlayDrivers final : public DriverRegistry {
  public:
   OverlayDrivers(DriverRegistry& below, const OverlayEvents& events)

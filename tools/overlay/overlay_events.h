@@ -1,4 +1,4 @@
-// What a run over an overlay reads, would write and logs, one event at a time.
+// What a run over an overlay reads, would write, and logs: one event at a time.
 #pragma once
 
 #include <cstdint>
@@ -17,12 +17,12 @@ struct OverlayEvent {
     File,            // its path; its size in bytes, or why it cannot be read
     Answer,          // a question to the device
     Control,         // a system control; data, or the error as text
-    Fact,            // of the device, by its name
+    Fact,            // about the device, by its name
     Library,         // a library or a function of it; whether it was found
     Statistics,      // "scalars of day 20000"; the number of rows
     Driver,          // the class or name of a driver; whether it was found
     Drivers,         // the drivers looked for; the outcome
-    DriverProperty,  // "driver key"; containers by their kind
+    DriverProperty,  // "driver key"; for a container, its kind
     DriverCall,      // "driver method 8"; the outcome
     // Changes. The value is what would be written.
     SetPreference,     // "domain key"
@@ -35,7 +35,7 @@ struct OverlayEvent {
     SendOn,      // what would leave the pending folder
     Notification,
     CleanUp,   // what would be removed, and its files
-    RollOver,  // what would be rolled
+    RollOver,  // what would be rolled over
     // Messages.
     LogLine,    // the level's name; the message
     ErrorText,  // standard error; the exact text, with or without a line end
@@ -47,7 +47,7 @@ struct OverlayEvent {
   plist::Value value;
 };
 
-/// Delivers events as they happen. The run may change a value once the handler has returned.
+/// Delivers events as they happen. Once the handler has returned, the run may change the value.
 class OverlayEvents {
  public:
   using Handler = std::function<void(const OverlayEvent&)>;

@@ -1,6 +1,6 @@
-// A platform that changes nothing: reads go through to the device, writes stay in memory.
+// A platform that changes nothing: reads pass through to the device, writes stay in memory.
 //
-// With it the daemon's own code shows what a run would do:
+// It lets the daemon's own code show what a run would do:
 //
 //   OverlayPlatform overlay(context.linuxPlatform());
 //   BHReport(overlay.platform()).writeLogForYesterday(day, {});
@@ -31,13 +31,13 @@ class OverlayPlatform {
 
   Platform& platform();
 
-  /// Called for each read, change and message as it happens. The handler must not use the platform.
+  /// Receives each read, change and message as it happens. The handler must not use the platform.
   void setEventHandler(OverlayEvents::Handler handler);
-  /// Makes `content` the content of the device's file at `path`.
+  /// Makes reads of the device's file at `path` return `content`.
   void replaceFile(std::string path, std::string content);
 
   const std::vector<CapturedLog>& logs() const;
-  /// The last entry at error level, empty when there was none.
+  /// The last entry at error level; empty when there was none.
   std::string_view lastError() const;
 
  private:

@@ -1,4 +1,4 @@
-// Services from which a run only reads; each reports what was read.
+// Services that a run only reads; each reports what was read.
 #pragma once
 
 #include <cstring>
@@ -154,7 +154,7 @@ class OverlayLocale final : public Locale {
   const OverlayEvents& events_;
 };
 
-/// Library functions that access preferences access those of the overlay.
+/// Library functions that access preferences use those of the overlay.
 class OverlayLibrary final : public DynamicLibrary {
  public:
   OverlayLibrary(std::unique_ptr<DynamicLibrary> below, Preferences& preferences,

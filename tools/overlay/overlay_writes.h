@@ -1,5 +1,5 @@
-// Services to which a run writes. Its writes stay in memory and are reported; its reads come from
-// the device and from its earlier writes.
+// Services that a run writes to. Writes stay in memory and are reported; reads return data from the
+// device and earlier writes of the run.
 #pragma once
 
 #include <map>
@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// A log that was passed to the submission service.
+/// A log that was handed to the submission service.
 struct CapturedLog {
   std::string type;
   std::string name;

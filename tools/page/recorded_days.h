@@ -1,4 +1,4 @@
-// What a device recorded on some days, by key.
+// What a device recorded over some days, by key.
 #pragma once
 
 #include <cstdint>
@@ -14,9 +14,9 @@
 
 namespace tavrel {
 
-/// The values of a distribution on the page's day.
+/// A distribution's values on the day that is shown.
 struct DayValues {
-  std::optional<double> median;  // nothing when there are too many values to sort them
+  std::optional<double> median;  // nothing when there are too many values to sort
   std::vector<DistributionView::Bucket> buckets;
 };
 
@@ -35,20 +35,20 @@ struct RecordedDistribution {
 struct RecordedDays {
   std::int32_t first = 0;
   std::int32_t last = 0;  // included
-  std::int32_t day = 0;   // whose figures are shown
+  std::int32_t day = 0;   // the day whose figures are shown
   std::map<std::string, RecordedScalar, std::less<>> scalars;
   std::map<std::string, RecordedDistribution, std::less<>> distributions;
   std::string fault;  // why something may be missing; empty when nothing is
 
-  /// Of the day that is shown, which no statistic goes beyond; null without a value.
+  /// The value on the day that is shown, which is the last one possible; null without a value.
   template <class Value>
   const Value* ofDay(const ByDay<Value>& days) const {
     return !days.empty() && days.back().first == day ? &days.back().second : nullptr;
   }
 };
 
-/// So many days up to `day`. Without it, up to yesterday, or, when these have nothing, up to the
-/// last day that has; the day that is shown is then the last one with statistics.
+/// Reads `days` days up to `day`. Without it, up to yesterday or, when that finds nothing, up to
+/// the last day that has any; the day that is shown is then the last one with statistics.
 RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
                               std::int32_t days);
 

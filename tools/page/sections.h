@@ -1,4 +1,4 @@
-// The sections of a device's page. Each writes what it knows and says what it leaves out.
+// The sections of a device's page. Each writes what it knows and says what it left out.
 #pragma once
 
 #include <cstdint>
@@ -16,13 +16,13 @@
 
 namespace tavrel {
 
-/// The log of the page's day, as it would leave the device.
+/// The log of the day that is shown, as it would leave the device.
 struct PageLog {
   std::string reason;         // why there is none; empty when there is one
   plist::Dictionary scalars;  // an empty handle without a log
   std::vector<DistributionView> distributions;
   bool isCovered = false;           // by the owner's permission
-  std::vector<std::string> errors;  // met while it was made
+  std::vector<std::string> errors;  // that occurred while it was made
 };
 
 /// What all sections share.
@@ -34,7 +34,7 @@ struct PageScene {
   std::string osVersion;
 };
 
-/// How much a section may hold, so that a page stays below 2 MB whatever the device has.
+/// How much a section may hold, so that a page stays below 2 MB whatever the device contains.
 struct SectionLimit {
   std::size_t items;
   std::size_t bytes;
@@ -49,24 +49,24 @@ void writeHealth(PageScene& scene, const std::vector<Check>& checks);
 void writeScalars(PageScene& scene);
 void writeDistributions(PageScene& scene);
 void writeTrends(PageScene& scene);
-/// Channels that tell how long states lasted.
+/// Channels that measure how long states lasted.
 void writeStates(PageScene& scene);
 void writeDrives(PageScene& scene);
 void writeNotes(PageScene& scene);
 
-// -- What several sections need ------------------------------------------------------------------
+// -- Helpers for several sections -----------------------------------------------------------------
 
-/// A key with its meaning below it, as it heads a row.
+/// Writes a key with its meaning below it, as the heading of a row.
 void writeKey(page::HtmlWriter& html, std::string_view key);
-/// Begins a card with a heading, which the caller ends; a long key gets a wide one.
+/// Begins a card with a heading. The caller must end it. A long key gets a wide card.
 void beginCard(page::HtmlWriter& html, std::string_view key);
-/// The unit that the catalogue has for a key; empty when it is not known.
+/// The catalogue's unit for a key; empty when unknown.
 std::string_view unitOf(std::string_view key);
-/// A fact in a list of them, from outside; `style` is "good", "warn", "bad" or empty.
+/// Writes one fact of a list, with outside text; `style` is "good", "warn", "bad" or empty.
 void writeFact(page::HtmlWriter& html, std::string_view term, std::string_view text,
                std::string_view style = {});
-/// Says that so many of `what`, in the singular, are only in the output of the command `where`.
-/// Nothing for 0.
+/// Says that `count` of `what`, given in the singular, appear only in the output of the command
+/// `where`. Writes nothing for 0.
 void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view what,
                   std::string_view where);
 

@@ -11,19 +11,19 @@
 
 namespace tavrel {
 
-/// Yields whole lines, each once. The beginning of a line is read again with its end, because a
-/// writer may cut it off first. A file that has lost whole lines is read from its beginning.
+/// Yields whole lines, each once. An unfinished line is read again from its beginning, because a
+/// writer may truncate it first. A file that has lost whole lines is read again from the start.
 class RecordReader {
  public:
   using LineHandler = std::function<void(std::string_view line, std::uint64_t number)>;
 
   explicit RecordReader(std::string path) : path_(std::move(path)) {}
 
-  /// The lines that were added since the last call. A line of more than
+  /// Hands out the lines added since the last call. A line of more than
   /// `limits::kStructuredRecordFileBytes` is an error. Lines torn by a kill or a power cut are left
-  /// out: those of zero bytes and, when the file `isComplete`, a last one without its end.
+  /// out: lines of zero bytes and, when the file `isComplete`, a last line without its end.
   Status read(bool isComplete, const LineHandler& handler);
-  /// An error when lines were left out as torn.
+  /// An error when torn lines were left out.
   Status wholeness() const;
 
   const std::string& path() const { return path_; }
@@ -32,7 +32,7 @@ class RecordReader {
   void leaveOutTornLine();
 
   std::string path_;
-  std::int64_t offset_ = 0;  // of the first line that was not handed out
+  std::int64_t offset_ = 0;  // of the first line not yet handed out
   std::uint64_t lines_ = 0;
   std::uint64_t tornLines_ = 0;
   std::uint64_t firstTornLine_ = 0;
@@ -44,11 +44,11 @@ struct StructuredRecord {
   plist::Dictionary content;
 };
 
-/// The record in one line. The error says why there is none.
+/// Parses one line. The error says why it holds no record.
 Expected<StructuredRecord> parseRecord(std::string_view line);
 
-/// A record on one line: "id=4 count=2 stages=[1,2,3]", the last for "stages[0]", "stages[1]" and
-/// so on.
+/// A record as one line of text: "id=4 count=2 stages=[1,2,3]". Fields such as "stages[0]" and
+/// "stages[1]" become one list.
 std::string recordText(const plist::Dictionary& record);
 
 }  // namespace tavrel

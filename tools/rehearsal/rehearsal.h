@@ -14,7 +14,7 @@ namespace tavrel {
 class LinuxPlatform;
 
 enum class RehearsedRun : std::uint8_t {
-  Gated,   // yesterday, unless it was done
+  Gated,   // yesterday, unless already done
   Forced,  // yesterday in any case
   Today,   // today
 };

@@ -1,4 +1,4 @@
-// Freezes what the machine shows live into a recording.
+// Freezes the machine's live channels into a recording.
 #pragma once
 
 #include <cstdint>
@@ -8,9 +8,9 @@
 
 namespace tavrel {
 
-/// All live services with the elements of their channels: one sample now and one after each of so
-/// many seconds, which a hub plays back in their order. Channels without a value in any of them are
-/// published, but not known to its hub. An empty handle after a message that says why.
+/// All live services with their channels' elements: one sample now and one more each second for
+/// `seconds` seconds, which a hub plays back in order. Channels without a value in any sample are
+/// published but unknown to their hub. Returns an empty handle after a message that says why.
 plist::Dictionary recordLive(ToolContext& context, std::uint32_t seconds);
 
 }  // namespace tavrel

@@ -8,15 +8,15 @@
 
 namespace tavrel {
 
-/// A delta without the channels that cannot be subtracted.
+/// A delta without the channels that could not be subtracted.
 struct PartialDelta {
   plist::Dictionary samples;
   std::size_t leftOut = 0;
   std::string firstLeftOut;  // "DRIVER GROUP SUBGROUP NAME: REASON"
 };
 
-/// For samples whose delta cannot be computed as a whole. A channel without an earlier sample keeps
-/// its values.
+/// For samples whose delta cannot be computed as a whole. A channel that has no
+/// earlier sample keeps its values.
 PartialDelta subtractEach(const plist::Dictionary& previous, const plist::Dictionary& current);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// Values of channels in familiar units.
+// Channel values in familiar units.
 #pragma once
 
 #include <cstdint>
@@ -10,14 +10,14 @@
 
 namespace tavrel {
 
-/// A figure in bytes, degrees Celsius ("°C") or an SI unit without a prefix.
+/// A figure in bytes, degrees Celsius ("°C") or an unprefixed SI unit.
 struct ConvertedValue {
   double value;
   std::string_view unit;
 };
 
-/// Converts `value` from the unit of its channel. Nothing for counts and for units that cannot be
-/// converted.
+/// Converts `value` from its channel's unit. Nothing for counts, and for units
+/// that cannot be converted.
 std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, std::int64_t value);
 
 /// "309.7 GiB", "41.3 °C", "12.5 ms".

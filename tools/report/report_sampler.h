@@ -13,21 +13,21 @@
 
 namespace tavrel {
 
-/// The channels that a command line selects. Notes tell of drivers that cannot be read.
+/// The channels that a command line selects. Notes name drivers that cannot be read.
 Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
                                              const ReportSelection& selection);
 
 class Sampler {
  public:
-  /// Says what is wrong when it cannot subscribe.
+  /// Prints what is wrong when it cannot subscribe.
   Sampler(ToolContext& context, const ReportSelection& selection);
 
   explicit operator bool() const { return subscription_ != nullptr; }
 
-  /// An empty handle after a message that says why.
+  /// An empty handle when it fails, after a message that says why.
   plist::Dictionary sample();
 
-  /// Subscribed channels that have no values, and why that may be.
+  /// How many subscribed channels have no values, and the likely reason.
   std::int32_t missing(const plist::Dictionary& samples) const;
   const char* reasonForMissing() const;
 

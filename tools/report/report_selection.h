@@ -15,45 +15,45 @@
 
 namespace tavrel {
 
-/// Conditions from the command line, already checked; empty for none. All must hold.
+/// Conditions from the command line, already validated; empty when not given. All must hold.
 struct ReportSelection {
   std::string group;
   std::string subGroup;
   std::string categories;  // a mask; a channel must have one of its categories
   std::string format;
   std::string unit;       // a label or a number
-  std::string driver;     // its name, with or without the id, or its id
+  std::string driver;     // the name, with or without the id, or the id
   bool live = false;      // only of live services
-  bool recorded = false;  // only of recorded ones; with both, of all
+  bool recorded = false;  // only of recorded ones; both flags together select all
 };
 
 void addSelectionOptions(Command command, ReportSelection& selection);
 
-/// The published channels that the selection keeps, filed by driver and group. The error says why
-/// there are none.
+/// The published channels that match the selection, grouped by driver and group. The
+/// error says why there are none.
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection);
 
 /// Removes the channels that `--live` and `--recorded` exclude; `live` are the live services.
 void keepOrigin(const plist::Dictionary& channels, const ReportSelection& selection,
                 const plist::Array& live);
 
-/// All channels of an aggregate, in its order.
+/// All channels of an aggregate, in order.
 std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);
 
 inline constexpr std::string_view kLookAtDrivers =
     "'tavrelctl registry list' shows the drivers and the hub";
 
-/// The words of an error that has more than its code.
+/// The reason that an error gives beyond its code.
 std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error);
 
-/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without unknown parts.
+/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without the parts that are unknown.
 std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
                           std::string_view advice = kLookAtDrivers);
 
-/// "simple", "state", "histogram", "array", "unknown" or the number of another format.
+/// "simple", "state", "histogram", "array", "unknown", or the number of any other format.
 std::string formatName(std::uint8_t format);
 
-/// A number of at most 64 bits, decimal or with 0x.
+/// A number of at most 64 bits, in decimal or with 0x.
 std::optional<std::uint64_t> parseWord(std::string_view text);
 
 }  // namespace tavrel

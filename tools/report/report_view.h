@@ -6,11 +6,11 @@
 
 namespace tavrel {
 
-/// A tree by driver, group and subgroup, or with `flat` a table of one line a channel.
+/// Prints a tree by driver, group and subgroup or, with `flat`, a table with one line per channel.
 void printChannels(const Page& page, const plist::Dictionary& channels, bool flat);
 
-/// The values of sampled channels, in familiar units. Counts of a delta are differences,
-/// and may be negative.
+/// Prints the values of sampled channels in familiar units. Counts of a delta are
+/// differences and may be negative.
 void printSamples(const Page& page, const plist::Dictionary& samples, bool isDelta);
 
 }  // namespace tavrel

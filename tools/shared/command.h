@@ -1,13 +1,13 @@
-// Subcommands and their options, over CLI11; only command.cc, command_model.cc, command_line.cc and
-// those that make the top of a program include its headers.
+// Subcommands and their options, built on CLI11. Only command.cc, command_model.cc, command_line.cc
+// and the files that make the top of a program include its headers.
 //
 //   const Command group = top.addGroup("log", "Show submitted logs");
 //   const Command list = group.addCommand("list", "List the pending logs");
 //   list.addOption("--day", arguments->day, "Only those of one day").typeName("DAY");
 //   list.onRun([&context, arguments] { ... });
 //
-// Both classes are handles: a copy names the same command or option. The targets of options must
-// live until the command line has been parsed.
+// Both classes are handles: a copy refers to the same command or option. The targets of options
+// must live until the command line has been parsed.
 #pragma once
 
 #include <functional>
@@ -33,7 +33,7 @@ class Option {
   /// Shows the target's current value in the help.
   Option showDefault() const;
   Option oneOf(std::initializer_list<std::string> values) const;
-  /// `fault` says what is wrong with the text of a value; empty when nothing is.
+  /// `fault` returns what is wrong with the text of a value, or an empty string.
   Option check(std::function<std::string(const std::string& text)> fault) const;
   Option excludes(const Option& other) const;
 
@@ -46,22 +46,22 @@ class Command {
   explicit Command(CLI::App& app) : app_(&app) {}
 
   Command addCommand(const char* name, const char* description) const;
-  /// A command that has only subcommands, one of which is required.
+  /// A command that consists only of subcommands, one of which is required.
   Command addGroup(const char* name, const char* description) const;
-  /// Options under a heading of their own, of which at most one may be given.
+  /// A group of options under its own heading, of which at most one may be given.
   Command addChoice(const char* heading) const;
 
-  /// "-v,--verbose" is an option, "FILE" an argument. Targets: std::string, double and 32-bit
-  /// unsigned integers, also optional ones, and std::vector<std::string> for repeated arguments.
+  /// "-v,--verbose" is an option, "FILE" an argument. Targets may be std::string, double and 32-bit
+  /// unsigned integers, each also optional, and std::vector<std::string> for repeated arguments.
   template <class Target>
   Option addOption(const char* names, Target& target, const char* description) const;
   Option addFlag(const char* names, bool& target, const char* description) const;
   Option addFlag(const char* names, std::function<void()> onGiven, const char* description) const;
 
-  /// Text after the options in the help.
+  /// Sets the text after the options in the help.
   void setFooter(std::string text) const;
 
-  /// Leaves the command out of the help, for commands that only other programs use.
+  /// Hides the command from the help, because only other programs use it.
   void hide() const;
 
   void onRun(std::function<void()> action) const;

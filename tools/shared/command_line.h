@@ -1,4 +1,4 @@
-// Parsing of a command line, with usage errors in the form of all our programs.
+// Parses a command line, with usage errors in the form that all our programs use.
 #pragma once
 
 #include <string>
@@ -12,8 +12,8 @@ class App;
 
 namespace tavrel {
 
-/// Parses the arguments and runs the subcommand that they name. Help, the version and usage errors
-/// go to `output`. What a subcommand throws is thrown on.
+/// Parses the arguments and runs the subcommand that they name. Prints help, the version and usage
+/// errors to `output`. Exceptions from a subcommand reach the caller.
 void runCommandLine(CLI::App& app, const std::vector<std::string>& arguments, ToolOutput& output);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// What a command line may hold, as plain data: for completions and manual pages.
+// The possible content of a command line as plain data, for completions and manual pages.
 #pragma once
 
 #include <string>
@@ -8,18 +8,18 @@
 
 namespace tavrel {
 
-/// An option, or an argument without a dash.
+/// An option, or an argument that has no dash.
 struct OptionModel {
-  std::vector<std::string> names;    // "-v", "--verbose"; of an argument none
+  std::vector<std::string> names;    // "-v", "--verbose"; none for an argument
   std::string value;                 // "DAY"; empty for a flag
-  std::vector<std::string> choices;  // the only values, where they are few
+  std::vector<std::string> choices;  // the only values, when there are few
   std::string description;
   bool isRequired = false;
   bool mayRepeat = false;
-  std::vector<std::string> excludes;  // the last names of options that cannot be given with it
+  std::vector<std::string> excludes;  // the last names of options that it rules out
 
   bool isFlag() const { return value.empty(); }
-  /// The last name, which is the long one where there are two.
+  /// The last name, which is the long one when there are two.
   const std::string& name() const { return names.back(); }
 };
 
@@ -28,14 +28,14 @@ struct CommandModel {
   std::string name;  // "list"
   std::string description;
   std::vector<OptionModel> options;    // without --help
-  std::vector<OptionModel> arguments;  // in their order
+  std::vector<OptionModel> arguments;  // in order
   std::vector<CommandModel> commands;
 };
 
-/// Commands without a heading in the help are left out.
+/// Leaves out commands that the help hides.
 CommandModel modelOf(const Command& program);
 
-/// Calls `visit` for the command and all below it, in the order of the help.
+/// Calls `visit` for the command and all commands below it, in the order of the help.
 template <class Visit>
 void walk(const CommandModel& command, const Visit& visit) {
   visit(command);

@@ -1,4 +1,4 @@
-// Days in the form in which people write and read them.
+// Days the way people write and read them.
 #pragma once
 
 #include <cstdint>
@@ -11,8 +11,8 @@
 
 namespace tavrel {
 
-/// Reads a day number or "YYYY-MM-DD", and, when given today's number, also "today" and
-/// "yesterday". The error says what is wrong with the text.
+/// Reads a day number or "YYYY-MM-DD". When `today` is given, "today" and "yesterday" work as well.
+/// The error says what is wrong with the text.
 Expected<std::int32_t> parseDay(std::string_view text,
                                 std::optional<std::int32_t> today = std::nullopt);
 

@@ -1,4 +1,4 @@
-// The summaries and histograms of a tallied log, read back; histograms as bars.
+// The distributions and histograms of a tallied log, read back; histograms as bars.
 #pragma once
 
 #include <cstddef>
@@ -26,20 +26,20 @@ struct DistributionView {
   double mean = 0;
   double squaredDeviations = 0;  // sum of squared deviations from the mean
   std::int64_t count = 0;
-  std::vector<Bucket> buckets;  // of the histogram, from low to high; empty without one
+  std::vector<Bucket> buckets;  // of the histogram, ascending; empty without one
 
-  /// The root of the mean squared deviation; nothing when nothing was counted.
+  /// The root of the mean squared deviation; nothing when the count is 0.
   std::optional<double> standardDeviation() const;
 };
 
-/// One line a bucket: label, count, and a bar in proportion to the largest count.
+/// One line per bucket: label, count, and a bar proportional to the largest count.
 void printBuckets(const Page& page, std::span<const DistributionView::Bucket> buckets);
 
 /// Whether an entry of "BHDistributions" is a summary: minimum, maximum, mean, squared deviations,
 /// count.
 bool isSummary(const plist::Value& entry);
 
-/// The distributions of a log, ordered by key. Entries that are not a summary are skipped.
+/// The distributions of a log, ordered by key. Skips entries that are not a summary.
 std::vector<DistributionView> distributionsOf(const plist::Dictionary& log);
 
 }  // namespace tavrel

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-/// `key` is a key of the NAND information, with or without its common prefix, or a scalar of a log.
+/// `key` is a key of the NAND information, with or without the common prefix, or a scalar of a log.
 bool isErrorFigure(std::string_view key);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// Files that a command line names.
+// Input files named on the command line.
 #pragma once
 
 #include <cstddef>
@@ -11,14 +11,14 @@
 
 namespace tavrel {
 
-/// The content of a file of this machine, or of standard input for "-". At most `largest` bytes.
+/// The content, at most `largest` bytes, of a file of this machine, or of standard input for "-".
 Expected<std::string> readInput(ToolContext& context, const std::string& file, std::size_t largest);
 
-/// A property list of either encoding, or JSON (tools/shared/json_value.h), recognised by content.
-/// The error begins with `name`.
+/// Decodes a property list in either encoding, or JSON (tools/shared/json_value.h); recognises the
+/// format from the content. The error begins with `name`.
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name);
 
-/// Both.
+/// Reads and decodes a file.
 Expected<plist::Value> readDocument(ToolContext& context, const std::string& file);
 
 }  // namespace tavrel

@@ -1,5 +1,5 @@
-// A JSON object whose last member is a list, printed element by element, so that long lists need no
-// memory.
+// A JSON object whose last member is a list, printed element by element, so that
+// long lists take no memory.
 //
 //   JsonList list(context.out(), {{"sample", 1}}, "channels");
 //   for (...) list.add({{"name", ...}});
@@ -20,13 +20,13 @@ class JsonList {
   /// Indented like other documents, or a single line.
   enum class Layout : std::uint8_t { Document, Line };
 
-  /// Prints "format_version" and the members of `head`, and begins the list `name`.
+  /// Prints "format_version" and the members of `head`, then begins the list `name`.
   JsonList(std::ostream& out, Json head, std::string_view name, Layout layout = Layout::Document);
 
   void add(const Json& element);
-  /// An element that is JSON already; it is printed as it is.
+  /// Adds an element that is already JSON; it is printed unchanged.
   void addText(std::string_view json);
-  /// Writes elements for `addText` with the indentation that they have in the list.
+  /// A writer of elements for `addText`, with the indentation that they need in the list.
   JsonWriter elementWriter() const;
   /// Ends the list, the object and its line.
   void end();

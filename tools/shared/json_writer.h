@@ -1,5 +1,5 @@
-// Writes JSON directly as text, for long lists: building and freeing a tree of values takes several
-// times as long as writing its text.
+// Writes JSON directly as text, for long lists: building and freeing a tree of values
+// takes several times as long.
 //
 //   json.beginObject();
 //   json.member("name").text(name);
@@ -8,7 +8,7 @@
 //   json.endArray();
 //   json.endObject();
 //
-// The text is the one that `jsonText` gives for the same values. Names of members are not escaped.
+// The text equals that of `jsonText` for the same values. Names of members are not escaped.
 #pragma once
 
 #include <cstddef>
@@ -21,10 +21,10 @@ namespace tavrel {
 
 class JsonWriter {
  public:
-  /// Lines are indented by `indent` spaces, and more as values nest. Without it, all is one line.
+  /// Indents lines by `indent` spaces, and nested values further. Without it, writes one line.
   explicit JsonWriter(std::optional<std::size_t> indent) : indent_(indent) {}
 
-  /// What was written; the next value begins a new text after `clear`.
+  /// The text written so far; after `clear`, the next value begins a new text.
   std::string_view text() const { return text_; }
   void clear() { text_.clear(); }
 
@@ -33,7 +33,7 @@ class JsonWriter {
   void beginArray() { begin('['); }
   void endArray() { end(']'); }
 
-  /// One of the values below, or one of the containers above, follows each.
+  /// Each must be followed by one of the values below or one of the containers above.
   JsonWriter& member(std::string_view name);
   JsonWriter& element();
 
@@ -41,9 +41,9 @@ class JsonWriter {
   void boolean(bool value) { text_ += value ? "true" : "false"; }
   void integer(std::int64_t value);
   void integer(std::uint64_t value);
-  /// Not-a-number and infinities become null.
+  /// Writes null for not-a-number and infinities.
   void real(double value);
-  /// Malformed UTF-8 is repaired.
+  /// Repairs malformed UTF-8.
   void text(std::string_view value);
 
  private:
@@ -53,7 +53,7 @@ class JsonWriter {
 
   const std::optional<std::size_t> indent_;
   std::size_t depth_ = 0;
-  bool isFirst_ = true;  // of the members or elements of the container that is open
+  bool isFirst_ = true;  // in the innermost open container
   std::string text_;
 };
 

@@ -1,5 +1,5 @@
-// The device's platform for commands that use its drivers: the tool's notes show what the system's
-// own operations print.
+// The device's platform for commands that use its drivers: whatever the system's own operations
+// print appears as notes of the tool.
 //
 //   NotingPlatform noting(context);
 //   const plist::Dictionary info = CopyNANDInfo(noting.platform());
@@ -14,8 +14,8 @@
 
 namespace tavrel {
 
-/// Both standard streams as notes, so that they do not mix with the tool's output. Each text is a
-/// message of its own, with or without a line end.
+/// Turns both standard streams into notes, so that they do not mix with the tool's output. Each
+/// text is a separate message, with or without a line end.
 class NotingStreams final : public StandardStreams {
  public:
   explicit NotingStreams(ToolContext& context) : context_(context) {}

@@ -1,4 +1,4 @@
-// Files that a command line names for output.
+// Output files named on the command line.
 #pragma once
 
 #include <string>
@@ -9,8 +9,8 @@
 
 namespace tavrel {
 
-/// Makes `bytes` the content of a file of this machine, in one step; "-" is standard output. The
-/// folder must exist; refuses anything but a regular file.
+/// Atomically replaces the content of a file of this machine with `bytes`; "-" is standard output.
+/// The folder must exist. Refuses to replace anything but a regular file.
 Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes);
 
 }  // namespace tavrel

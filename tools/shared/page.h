@@ -1,4 +1,4 @@
-// The output for text that people read: its stream, what is known of the terminal, and emphasis.
+// The output for human readers: its stream, what is known about the terminal, and emphasis.
 #pragma once
 
 #include <cstddef>
@@ -10,21 +10,21 @@
 
 namespace tavrel {
 
-/// Titles are strong; figures that somebody should look into are alarms.
+/// Titles are strong; figures that need attention are alarms.
 enum class Emphasis : std::uint8_t { None, Strong, Alarm };
 
 struct Page {
   std::ostream& out;
-  /// Of the terminal; nothing in a pipe, where lines are never cut.
+  /// Of the terminal; nothing in a pipe, whose lines are never cut.
   std::optional<std::size_t> columns = std::nullopt;
-  /// Whether the terminal shows colours, and the user wants them.
+  /// Whether the terminal shows colours and the user wants them.
   bool isColoured = false;
 
-  /// The columns for lines with bars: the same in every pipe.
+  /// How wide lines with bars may be; in a pipe always the same.
   std::size_t barColumns() const { return columns.value_or(80); }
 
-  /// `text`, which must be printable, between the terminal's control sequences; unchanged without
-  /// colours.
+  /// `text`, which must be printable, enclosed in the terminal's control sequences; unchanged
+  /// when there are no colours.
   std::string styled(std::string_view text, Emphasis emphasis) const;
 };
 

@@ -1,4 +1,4 @@
-// The entries of a dictionary in the order of their keys.
+// The entries of a dictionary, sorted by key.
 #pragma once
 
 #include <algorithm>
@@ -8,7 +8,7 @@
 
 namespace tavrel {
 
-/// Borrowed from the dictionary.
+/// The entries are borrowed from the dictionary.
 inline std::vector<const plist::Entry*> sortedEntries(const plist::Dictionary& dictionary) {
   std::vector<const plist::Entry*> entries;
   entries.reserve(dictionary.size());

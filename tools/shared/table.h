@@ -1,4 +1,4 @@
-// Tables, bars and texts from outside, for people.
+// Tables, bars and untrusted text for human readers.
 #pragma once
 
 #include <cstddef>
@@ -13,17 +13,17 @@
 
 namespace tavrel {
 
-/// `text` on one line and harmless to a terminal: control characters and malformed bytes become
-/// escapes (\n, \t, \x1b).
+/// `text` on one line and harmless to a terminal: control characters and malformed bytes
+/// become escapes (\n, \t, \x1b).
 std::string printable(std::string_view text);
 
-/// The columns of `text` on a terminal: one per code point.
+/// How many columns `text` takes on a terminal: one per code point.
 std::size_t displayWidth(std::string_view text);
 
 /// "1 value", "2 values".
 std::string counted(std::uint64_t count, std::string_view what);
 
-/// Rows of texts in aligned columns, two blanks between them.
+/// Rows of text in aligned columns, separated by two blanks.
 class Table {
  public:
   /// Left-aligned or right-aligned text, text that is never cut, or bars.
@@ -31,19 +31,19 @@ class Table {
   struct Column {
     std::string title;
     Align align = Align::Left;
-    /// On a terminal too narrow for all columns, those with the highest rank are left out first;
-    /// those with 0 stay.
+    /// On a terminal too narrow for all columns, the ones with the highest rank are left out
+    /// first; those with rank 0 stay.
     unsigned rank = 0;
   };
   struct Cell {
     Cell(const char* cellText) : text(cellText) {}
     Cell(std::string cellText, Emphasis cellEmphasis = Emphasis::None)
         : text(std::move(cellText)), emphasis(cellEmphasis) {}
-    /// A bar that fills `value` out of `largest` of its column; at least one mark unless `value` is
-    /// 0.
+    /// A bar as long as `value` relative to `largest` in its column; at least one
+    /// mark unless `value` is 0.
     static Cell bar(double value, double largest);
 
-    std::string text;  // made printable by the table
+    std::string text;  // the table makes it printable
     Emphasis emphasis = Emphasis::None;
     double share = 0;  // of a bar
   };
@@ -55,10 +55,10 @@ class Table {
   void add(std::vector<Cell> cells);
   bool empty() const { return rows_.empty(); }
 
-  /// On a terminal columns with a rank are left out as far as needed to fit, which a line below
-  /// says, and then the widest column of left-aligned text is cut ("…"); elsewhere all columns are
-  /// there, cells are whole, and long ones push the rest of their row aside. Bars take the columns
-  /// that are left. Titles that are all empty are not printed.
+  /// On a terminal, leaves out ranked columns until the table fits, says so in a line below it, and
+  /// then cuts the widest column of left-aligned text ("…"). Elsewhere all columns appear, cells
+  /// are whole, and long ones push the rest of their row to the right. Bars take the remaining
+  /// width. Titles are not printed when all are empty.
   void print(const Page& page);
 
  private:

@@ -34,15 +34,15 @@ class ToolContext : public ToolOutput {
   explicit ToolContext(const ToolStreams& streams);
   ~ToolContext();
 
-  /// The folder that `--root` names, otherwise the one of the environment, otherwise "/". Throws
-  /// std::runtime_error when the folder does not exist; `runTavrelctl` turns that into a failure.
+  /// The folder given by `--root`, else by the environment, else "/". Throws std::runtime_error
+  /// when the folder does not exist; `runTavrelctl` turns that into a failure.
   const DeviceRoot& root();
   /// Built over `root()` on the first call; include platform/linux/linux_platform.h to use it. Log
   /// lines of its services appear as notes.
   LinuxPlatform& linuxPlatform();
   Platform& platform();
   FilePreferences& preferences();
-  /// The device's store, for reading only: a damaged one stays in place for the next run.
+  /// The device's store, opened read-only: a damaged one stays in place for the next run.
   SqliteStore& storeForReading();
   /// Whether a service of the device has logged an error.
   bool hasComplaints() const { return hasComplaints_; }

@@ -1,4 +1,4 @@
-// What each subcommand of a program says and how it ends: standard streams, JSON, failures.
+// A subcommand's output and exit status: standard streams, JSON, failures.
 #pragma once
 
 #include <cstddef>
@@ -16,31 +16,31 @@ namespace tavrel {
 /// JSON whose objects keep the order in which their members were added.
 using Json = nlohmann::ordered_json;
 
-/// The version of the JSON forms that the tools print. It grows when a member changes its meaning
-/// or is removed; new members do not change it.
+/// The version of the JSON that the tools print. It increases when a member is removed or changes
+/// its meaning; new members do not change it.
 inline constexpr int kJsonFormatVersion = 1;
 
 /// `object` with "format_version" as its first member.
 Json withFormatVersion(Json object);
-/// `value` as text, indented by so many spaces, or on one line for -1. Malformed UTF-8 in it is
-/// repaired.
+/// `value` as text, indented by `indent` spaces, or on one line for
+/// -1. Repairs malformed UTF-8.
 std::string jsonText(const Json& value, int indent);
 
 enum ExitStatus : int { kExitSuccess = 0, kExitFailure = 1, kExitUsage = 2 };
 
-/// Standard streams, and the properties of their terminal.
+/// The standard streams, and the properties of their terminal.
 struct ToolStreams {
   std::istream& in;
   std::ostream& out;
   std::ostream& error;
-  /// Columns of the terminal to which `out` writes; nothing when it is not a terminal, and lines
-  /// are then never cut.
+  /// The width of the terminal that `out` writes to; nothing when it is not a terminal, and
+  /// lines are then never cut.
   std::optional<std::size_t> columns = std::nullopt;
   bool errorIsTerminal = false;
-  /// Whether `error` is read by the journal, which takes the priority of a line from its beginning.
+  /// Whether the journal reads `error`: it takes the priority of a line from its first characters.
   bool errorIsJournal = false;
   bool inIsTerminal = false;
-  /// Whether `out` is a terminal that shows colours to a user who wants them.
+  /// Whether `out` is a terminal that shows colours and the user wants them.
   bool outIsColoured = false;
 };
 
@@ -49,7 +49,7 @@ ToolStreams standardStreams();
 
 class ToolOutput {
  public:
-  /// `program` begins each line on `error()`; it must outlive this.
+  /// `program` begins each line on `error()`; the string must outlive this object.
   ToolOutput(const char* program, const ToolStreams& streams)
       : program_(program), streams_(streams) {}
   ToolOutput(const ToolOutput&) = delete;
@@ -60,13 +60,13 @@ class ToolOutput {
   std::istream& in() { return streams_.in; }
   std::ostream& out() { return streams_.out; }
   std::ostream& error() { return streams_.error; }
-  /// `out()` with what is known of its terminal.
+  /// `out()` with what is known about its terminal.
   Page page() { return {streams_.out, streams_.columns, streams_.outIsColoured}; }
   /// Nothing in a pipe.
   std::optional<std::size_t> columns() const { return streams_.columns; }
-  /// Whether to show progress of long work, on `error()`.
+  /// Whether to show the progress of long work on `error()`.
   bool showsProgress() const { return streams_.errorIsTerminal; }
-  /// Whether somebody can read a question and answer it.
+  /// Whether a person can read a question and answer it.
   bool canAsk() const { return streams_.inIsTerminal && streams_.errorIsTerminal; }
 
   // -- JSON --------------------------------------------------------------------------------------
@@ -79,14 +79,14 @@ class ToolOutput {
 
   // -- Ends --------------------------------------------------------------------------------------
 
-  /// Prints "PROGRAM: MESSAGE" as one line on `error()` and makes the exit status 1. The message
+  /// Prints "PROGRAM: MESSAGE" as one line on `error()` and sets the exit status to 1. The message
   /// says what, where and what to do: "cannot read whitelist: /x: Permission denied: run as root".
   void fail(std::string_view message);
-  /// The same with exit status 2, for arguments that only the subcommand can judge.
+  /// The same with exit status 2, for faulty arguments that only the subcommand can detect.
   void failUsage(std::string_view message);
-  /// A line that does not change the exit status.
+  /// Prints a line without changing the exit status.
   void note(std::string_view message);
-  /// Fails when what was printed has not arrived.
+  /// Fails when the output could not be written.
   void finish();
 
   int exitStatus() const { return exitStatus_; }

@@ -1,4 +1,4 @@
-// Property-list values from a command line: a text and its intended kind.
+// Property-list values on a command line: a text and its intended type.
 #pragma once
 
 #include <cstdint>
@@ -11,10 +11,10 @@ namespace tavrel {
 
 enum class ArgumentKind : std::uint8_t { Text, Boolean, Integer, Real, Date };
 
-/// The error says what is expected.
+/// The error says what form is expected.
 Expected<plist::Value> parseArgument(std::string_view text, ArgumentKind kind);
 
-/// Whether an XML property list can hold all texts and keys in `value`.
+/// Whether an XML property list can represent all texts and keys in `value`.
 bool hasXmlTextsOnly(const plist::Value& value);
 
 }  // namespace tavrel

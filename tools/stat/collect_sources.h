@@ -1,6 +1,6 @@
-// The state of the machine in /proc and /sys.
+// The machine's state in /proc and /sys.
 //
-// A figure that could not be read is nothing, never 0.
+// A figure that could not be read has no value; it is never 0.
 #pragma once
 
 #include <cstdint>
@@ -15,13 +15,13 @@
 
 namespace tavrel {
 
-/// Counters count since the machine started; a removed device takes its part with it.
+/// Counters run since the machine started; removing a device subtracts its part.
 struct MachineReading {
   std::optional<double> uptimeSeconds;
   std::optional<double> loadOfOneMinute;
   std::optional<std::uint64_t> processes;
 
-  /// Clock ticks of all CPUs together.
+  /// Clock ticks summed over all CPUs.
   struct CpuTicks {
     std::uint64_t busy;
     std::uint64_t total;
@@ -39,7 +39,7 @@ struct MachineReading {
     std::uint64_t out;
   };
   std::optional<Traffic> network;
-  /// Bytes of all disks with a device of their own, without loop devices, mappings and memory.
+  /// Bytes of all disks with a device of their own: no loop devices, mappings or RAM disks.
   std::optional<Traffic> disk;
 
   /// The hottest thermal zone.
@@ -50,11 +50,11 @@ struct MachineReading {
   std::optional<std::uint64_t> diskFreeMib;
 };
 
-/// Counting processes takes the kernel longer than all the rest.
+/// Counting processes takes the kernel longer than everything else together.
 enum class Processes : std::uint8_t { Counted, LeftOut };
 
-/// Reads the state again and again. Its files stay open: to find and open them takes the kernel
-/// longer than to read them. Files below the root take the place of the machine's own.
+/// Reads the state repeatedly. It keeps the files open, because the kernel takes longer to find and
+/// open them than to read them. Files below the root replace the machine's own.
 class MachineSources {
  public:
   /// The root must outlive it.
@@ -63,7 +63,7 @@ class MachineSources {
   MachineReading read(Processes processes);
 
  private:
-  /// What a file says now, valid until the next call; empty when it cannot be read.
+  /// The current content of a file, valid until the next call; empty when it cannot be read.
   std::string_view contentOf(std::string_view devicePath);
   void readCpu(MachineReading& reading);
   void readMemory(MachineReading& reading);
@@ -73,11 +73,11 @@ class MachineSources {
 
   const DeviceRoot& root_;
   std::map<std::string, Descriptor, std::less<>> files_;  // by path on the device
-  std::map<std::string, bool, std::less<>> disks_;        // whether a block device is one, by name
+  std::map<std::string, bool, std::less<>> disks_;        // whether it is a disk, by name
   std::string content_;
 };
 
-/// Ticks per second in which the kernel counts CPU time.
+/// The unit of the kernel's CPU time, in ticks per second.
 std::int64_t ticksPerSecond();
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// The reading that one run of `stat collect --once` leaves for the next, so that rates and sums
+// The reading that a run of `stat collect --once` leaves for the next one, so that rates and sums
 // span the time between the runs.
 #pragma once
 
@@ -14,19 +14,19 @@
 namespace tavrel {
 
 struct CollectState {
-  /// CLOCK_MONOTONIC, which starts from zero with the machine.
+  /// CLOCK_MONOTONIC, which starts at zero when the machine does.
   std::chrono::nanoseconds at{};
-  /// Of the reading only the counters are kept.
+  /// Only the counters of the reading are kept.
   MachineReading machine;
-  /// What a sum has left over below one, by key.
+  /// The fractional parts that sums have left over, by key.
   std::map<std::string, double> remainders;
 };
 
-/// The start of the machine, as the kernel names it; empty when unknown.
+/// The kernel's identifier for this boot of the machine; empty when unknown.
 std::string bootIdentity(const DeviceRoot& root);
 
-/// Nothing when there is no file, or when it is of another start of the machine, of the future or
-/// older than a day. An error when the file is none that `writeCollectState` wrote.
+/// Nothing when there is no file, or when its reading is from another boot, from the future or
+/// older than a day. An error when `writeCollectState` did not write the file.
 Expected<std::optional<CollectState>> readCollectState(const std::string& path,
                                                        const std::string& boot,
                                                        std::chrono::nanoseconds now);

@@ -1,11 +1,11 @@
-// The text form in which statistics are imported and exported, one row per line:
+// The text format for importing and exporting statistics, one row per line:
 //
 //   scalar<TAB>DAY<TAB>KEY<TAB>INTEGER
 //   value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE
 //
-// A day is a number of days since 1970-01-01, YYYY-MM-DD, "today" or "yesterday"; a key is UTF-8
-// without tabs and line ends, and not empty; SECONDS is the offset within the day, below 86400;
-// doubles are those of tools/stat/import_number.h.
+// DAY is a number of days since 1970-01-01, YYYY-MM-DD, "today" or "yesterday"; KEY is non-empty
+// UTF-8 without tabs and line ends; SECONDS is the offset within the day, below 86400; DOUBLE has
+// one of the forms in tools/stat/import_number.h.
 #pragma once
 
 #include <cstdint>
@@ -28,18 +28,18 @@ struct ImportLine {
   double value = 0;           // of a value
 };
 
-/// Reads one line without its end. The error says what is wrong.
+/// Parses one line, without its line end. The error says what is wrong.
 Expected<ImportLine> parseImportLine(std::string_view line, std::int32_t today);
 
-/// Cuts a stream into lines and reads each.
+/// Splits a stream into lines and parses each.
 class ImportParser {
  public:
   using Sink = std::function<Status(const ImportLine& line)>;
 
-  /// `today` is the number of the day that "today" means.
+  /// `today` is the number of the current day.
   explicit ImportParser(std::int32_t today) : today_(today) {}
 
-  /// Takes the next bytes. Stops at the first line that is bad or that the sink refuses.
+  /// Takes the next bytes. Stops at the first line that is malformed or that the sink refuses.
   Status feed(std::string_view bytes, const Sink& sink);
   /// Takes the last line when the stream does not end with a line end.
   Status finish(const Sink& sink);
@@ -51,11 +51,11 @@ class ImportParser {
   Status takeLine(std::string_view line, const Sink& sink);
 
   const std::int32_t today_;
-  std::string begun_;  // of a line whose end has not come yet
+  std::string begun_;  // of a line that is not complete yet
   std::uint64_t lines_ = 0;
 };
 
-/// False for a key that the form cannot hold.
+/// False for a key that the format cannot represent.
 bool isExportable(std::string_view key);
 
 void appendScalarLine(std::string& out, std::int32_t day, std::string_view key,

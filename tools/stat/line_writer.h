@@ -1,4 +1,4 @@
-// Collects lines and hands them on in large pieces.
+// Collects lines and writes them in large pieces.
 #pragma once
 
 #include <cstddef>
@@ -16,7 +16,7 @@ class LineWriter {
   LineWriter& operator=(const LineWriter&) = delete;
 
   std::string& buffer() { return buffer_; }
-  /// False when the stream takes no more.
+  /// False when the stream accepts no more.
   bool flushIfLarge() { return buffer_.size() < kLargeBytes || flush(); }
   bool flush() {
     out_.write(buffer_.data(), static_cast<std::streamsize>(buffer_.size()));

@@ -1,4 +1,4 @@
-// What is recorded of a reading of the machine, and how it is kept.
+// Which statistics are recorded from a reading of the machine, and how they are kept.
 #pragma once
 
 #include <cstdint>
@@ -12,12 +12,12 @@ namespace tavrel {
 
 enum class Keeping : std::uint8_t {
   Latest,  // a scalar, replaced by each reading
-  Sum,     // a scalar, added to by what happened since the reading before
+  Sum,     // a scalar, increased by what happened since the previous reading
   Series,  // a distribution, appended to by each reading
 };
 
-// Computes one statistic from a reading and the one before, which is null for the first. Nothing
-// when it is unknown.
+// Computes one statistic from a reading and the previous one, which is null for the first. Nothing
+// when the statistic is unknown.
 using Measure = std::optional<double> (*)(const MachineReading& now, const MachineReading* before,
                                           double secondsBetween);
 
@@ -27,7 +27,7 @@ struct MachineStatistic {
   Measure measure;
 };
 
-/// One row per statistic. docs/collect.md says what each is.
+/// One row per statistic. docs/collect.md describes each.
 std::span<const MachineStatistic> machineStatistics();
 
 /// The keys that are recorded, with their units, for people.

@@ -1,4 +1,4 @@
-// What the device has recorded: the store, and what waits to be folded into it.
+// What the device has recorded: the store, and what is waiting to be folded into it.
 #pragma once
 
 #include <cstdint>
@@ -12,8 +12,8 @@ namespace tavrel {
 inline constexpr std::int32_t kFirstDay = std::numeric_limits<std::int32_t>::min();
 inline constexpr std::int32_t kLastDay = std::numeric_limits<std::int32_t>::max();
 
-/// Opens it for reading. When something is missing, says so and makes the exit status 1; the rest
-/// can be read.
+/// Opens the recorded statistics for reading. When a part is missing, prints a message and sets the
+/// exit status to 1; the rest is readable.
 Expected<RecordedHistory> openRecorded(ToolContext& context, RowSelection selection);
 
 }  // namespace tavrel

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-/// Moves what programs recorded into the store, and says what that was.
+/// Moves what programs recorded into the store, and prints what that was.
 void foldStatistics(ToolContext& context);
 
 }  // namespace tavrel

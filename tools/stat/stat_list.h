@@ -1,4 +1,4 @@
-// The content of the store as a table or as JSON, printed while it is read.
+// The content of the store as a table or as JSON, printed as it is read.
 #pragma once
 
 #include <cstdint>
@@ -9,7 +9,7 @@
 
 namespace tavrel {
 
-/// Lists the statistics whose keys begin with `prefix`, of one day or of all.
+/// Lists the statistics whose keys begin with `prefix`, for one day or all days.
 void listStatistics(ToolContext& context, const std::string& prefix,
                     std::optional<std::int32_t> day);
 

@@ -1,4 +1,4 @@
-// Shows the progress of long work on a terminal, and nothing in a pipe.
+// Shows the progress of long work on a terminal; silent in a pipe.
 #pragma once
 
 #include <chrono>
@@ -20,7 +20,7 @@ class StatProgress {
   StatProgress& operator=(const StatProgress&) = delete;
 
   void show(std::string_view text);
-  /// "WHAT: COUNT rows", for loops too fast to read the clock in each round.
+  /// Shows "WHAT: COUNT rows". For loops too fast to check the clock in each round.
   void count(std::string_view what, std::uint64_t count) {
     if (count % kRowsBetweenLooks == 0 && context_.showsProgress()) showCount(what, count);
   }

@@ -10,7 +10,7 @@
 namespace tavrel {
 
 /// Prints a scalar day by day, or a distribution's summary, percentiles, histogram and a line for
-/// each day. Covers the last `days` days, today included, or all.
+/// each day. Covers the last `days` days, including today, or all days.
 void showStatistic(ToolContext& context, const std::string& key, std::optional<std::uint32_t> days);
 
 }  // namespace tavrel

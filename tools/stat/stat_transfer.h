@@ -1,4 +1,4 @@
-// Imports and exports statistics in the form of tools/stat/import_lines.h.
+// Imports and exports statistics in the format of tools/stat/import_lines.h.
 #pragma once
 
 #include <cstdint>
@@ -9,12 +9,12 @@
 
 namespace tavrel {
 
-/// Imports a file, or standard input for "-", as one transaction: a bad line ends it, and nothing
-/// of the file is kept. Values are appended to a distribution; scalars replace earlier ones.
+/// Imports a file, or standard input for "-", in one transaction: a malformed line ends it and
+/// undoes the whole file. Values are appended to a distribution; scalars replace earlier ones.
 void importStatistics(ToolContext& context, const std::string& file);
 
-/// Writes the rows whose keys begin with `prefix`, of one day or of all. Names keys that the form
-/// cannot hold, and then fails.
+/// Writes the rows whose keys begin with `prefix`, for one day or all days. When the format cannot
+/// represent some keys, names them and fails.
 void exportStatistics(ToolContext& context, const std::string& prefix,
                       std::optional<std::int32_t> day);
 

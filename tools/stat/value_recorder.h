@@ -1,5 +1,5 @@
-// Where today's values go: into memory with libbrimhold, which any user may do and which writes
-// nothing to flash, or into the store when the device has no folder for that.
+// Records today's values: in memory through libbrimhold, which any user may do and which writes
+// nothing to flash, or in the store when the device has no folder for that.
 //
 //   auto recorder = openRecorder(context);
 //   if (!recorder) return context.fail(recorder.error().message);
@@ -16,7 +16,7 @@
 
 namespace tavrel {
 
-/// When a value was measured. Memory goes by its own look at the same clock.
+/// When a value was measured. Recording in memory ignores this and reads the same clock itself.
 struct ValueTime {
   std::int32_t day;
   std::uint32_t secondsInDay;
@@ -26,21 +26,21 @@ ValueTime valueTimeNow();
 class ValueRecorder {
  public:
   virtual ~ValueRecorder() = default;
-  /// Errors of these three: the user may not record the key; the store cannot be written; a sum
-  /// goes beyond 64 bits.
+  /// These three fail when the user may not record the key, the store cannot be written,
+  /// or a sum exceeds 64 bits.
   virtual Status set(ValueTime time, const std::string& key, std::int64_t value) = 0;
   virtual Status add(ValueTime time, const std::string& key, std::int64_t amount) = 0;
   virtual Status append(ValueTime time, const std::string& key, double value) = 0;
-  /// In the store: commits what was given since the last call, in one transaction. In memory, where
-  /// each value is kept at once: an error when the folder was removed or is full, and values were
-  /// lost.
+  /// In the store, commits what was given since the last call in one transaction. In
+  /// memory, where each value is kept at once, fails when the folder was removed or is
+  /// full, so that values were lost.
   virtual Status keep() = 0;
   virtual bool isInMemory() const = 0;
 };
 
-/// The context must outlive the recorder. libbrimhold looks its folder up once: one process records
-/// for one device. An error when libbrimhold cannot record in the folder: the user may not create
-/// files there, memory or a limit is exhausted, the kernel is too old, or the system failed.
+/// The context must outlive the recorder. libbrimhold looks up its folder only once, so a process
+/// records for one device. Fails when libbrimhold cannot record in the folder: the user may not
+/// create files there, memory or a limit is exhausted, the kernel is too old, or the system failed.
 Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context);
 
 /// What is wrong with a key; nothing when it can be recorded and exported.

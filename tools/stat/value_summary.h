@@ -1,4 +1,4 @@
-// Figures that sum up many values without keeping them.
+// Figures that summarise many values without keeping them.
 //
 //   Summary summary;
 //   forEachValue([&](double value) { summary.add(value); });
@@ -8,7 +8,7 @@
 //     search.endPass();
 //   }
 //
-// Values that are not numbers are counted and otherwise skipped.
+// Values that are not numbers are counted and otherwise ignored.
 #pragma once
 
 #include <array>
@@ -28,21 +28,21 @@ class Summary {
 
   /// All values.
   std::int64_t count() const { return numbers_ + notNumbers_; }
-  /// Those that are numbers, infinities included. Without any, the other figures are undefined.
+  /// Values that are numbers, including infinities. Without any, the other figures are undefined.
   std::int64_t numbers() const { return numbers_; }
   std::int64_t notNumbers() const { return notNumbers_; }
   double minimum() const { return minimum_; }
   double maximum() const { return maximum_; }
-  /// Infinite when a value is; not a number when both infinities occur.
+  /// Infinite when a value is; not-a-number when both infinities occur.
   double mean() const;
-  /// The root of the mean squared deviation; not a number when a value is infinite.
+  /// The root of the mean squared deviation; not-a-number when a value is infinite.
   double standardDeviation() const;
 
-  /// Of the finite values. Without any, the other figures are undefined.
+  /// About the finite values. Without any, the other figures are undefined.
   bool hasFinite() const { return finite_ > 0; }
   double lowest() const { return lowest_; }
   double highest() const { return highest_; }
-  /// Whether all of them are whole.
+  /// Whether all of them are whole numbers.
   bool areWhole() const { return areWhole_; }
 
  private:
@@ -50,7 +50,7 @@ class Summary {
   std::int64_t notNumbers_ = 0;
   double minimum_ = 0;
   double maximum_ = 0;
-  // Of the finite ones.
+  // About the finite values:
   std::int64_t finite_ = 0;
   double lowest_ = 0;
   double highest_ = 0;
@@ -59,11 +59,11 @@ class Summary {
   double squaredDeviations_ = 0;
 };
 
-/// Finds percentiles exactly in four passes over the same values: 16 bits of each at a time. The
+/// Finds exact percentiles in four passes over the same values, 16 bits of each value per pass. The
 /// p-th percentile is the smallest value that at least p percent of the values do not exceed.
 class PercentileSearch {
  public:
-  /// `numbers`: how many values are numbers.
+  /// `numbers` is how many of the values are numbers.
   PercentileSearch(std::int64_t numbers, std::span<const int> percents);
 
   bool needsPass() const { return bitsKnown_ < 64 && !wanted_.empty(); }
@@ -74,7 +74,7 @@ class PercentileSearch {
   std::vector<double> values() const;
 
  private:
-  // The percentiles whose upper bits are the same, so far.
+  // The percentiles whose upper bits are the same so far.
   struct Branch {
     std::uint64_t upperBits;
     std::vector<std::int64_t> counts;  // by the next 16 bits
@@ -91,8 +91,8 @@ class PercentileSearch {
   std::vector<Branch> branches_;
 };
 
-/// Counts values into at most a dozen buckets of one width, "(a, b]", whose bounds are round
-/// numbers. Infinities have buckets of their own.
+/// Counts values in at most a dozen buckets "(a, b]" of equal width whose bounds are round numbers.
+/// Infinities have buckets of their own.
 class RoundHistogram {
  public:
   explicit RoundHistogram(const Summary& summary);

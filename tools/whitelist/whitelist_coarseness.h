@@ -1,4 +1,4 @@
-// How coarse the options of a whitelist make what leaves.
+// How much the options of a whitelist coarsen what leaves the device.
 #pragma once
 
 #include <string>
@@ -7,7 +7,7 @@
 
 namespace tavrel {
 
-/// Of later options beside earlier ones. Both hold when one option is finer and another coarser.
+/// Compares later options with earlier ones. Both are true when one is finer and another coarser.
 struct Coarseness {
   bool isFiner = false;
   bool isCoarser = false;
@@ -16,14 +16,14 @@ struct Coarseness {
 /// Compares the rounding of scalars: the width of buckets and the number of significant figures.
 Coarseness compareRounding(const plist::Dictionary& before, const plist::Dictionary& after);
 
-/// Compares the histograms of distributions. A boundary that the earlier options lack is finer.
+/// Compares the histograms of distributions. A boundary missing from the earlier options is finer.
 Coarseness compareIntervals(const plist::Dictionary& before, const plist::Dictionary& after);
 
-/// Whether every scalar is reported as it is, without a bucket width of 1 to say that this is
-/// meant.
+/// Whether every scalar is reported exactly, without a bucket width of 1 to
+/// show that this is intended.
 bool coarsensNoScalar(const plist::Dictionary& options);
 
-/// The options that affect a kind of statistics, for people.
+/// The options that affect a kind of statistics, as readable text.
 std::string optionsText(const plist::Dictionary& options, bool isScalar);
 
 }  // namespace tavrel

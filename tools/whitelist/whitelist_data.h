@@ -1,4 +1,4 @@
-// What a whitelist would let out of the statistics that the device holds.
+// What a whitelist would let out of the statistics recorded on the device.
 #pragma once
 
 #include <vector>
@@ -10,8 +10,8 @@
 namespace tavrel {
 
 /// Distributions of the last whole day in the store whose values the whitelist does not coarsen, or
-/// that a value which is not a number spoils; none without a store. Each value is read. When the
-/// store cannot be read, a line says so, the exit status becomes 2, and findings may be missing.
+/// that a not-a-number value spoils; none without a store. Reads every value. When the store cannot
+/// be read, prints a line and sets the exit status to 2; findings may then be missing.
 std::vector<WhitelistFinding> checkAgainstData(ToolContext& context, const plist::Value& whitelist);
 
 }  // namespace tavrel

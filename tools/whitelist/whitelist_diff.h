@@ -1,8 +1,8 @@
-// What changes for the statistics of a device when one whitelist replaces another.
+// What changes in the statistics that leave a device when one whitelist replaces another.
 //
-// Both are compared as a device that is not internal uses them, with all groups switched on: for
-// each key that one of them lists, and for all other keys that begin with a prefix that one of them
-// lists.
+// Both are compared as an ordinary (not internal) device uses them, with all groups switched
+// on: for each key that either of them lists, and for all other keys that begin with a prefix
+// that either of them lists.
 #pragma once
 
 #include <array>
@@ -16,18 +16,18 @@
 
 namespace tavrel {
 
-/// In the order in which they matter to somebody who reviews a change.
+/// In order of importance to somebody who reviews a change.
 enum class WhitelistChange : std::uint8_t { NewlyLeaves, Finer, Coarser, NoLongerLeaves };
 
 struct ChangedRule {
   bool isDistribution = false;
   bool isPrefix = false;
-  std::string key;           // or prefix
+  std::string key;           // or a prefix
   plist::Dictionary before;  // options; an empty handle when the statistics do not leave
   plist::Dictionary after;
 };
 
-/// By change. Options that are finer in one respect and coarser in another count as finer.
+/// Indexed by WhitelistChange. Options both finer and coarser in some respect count as finer.
 using WhitelistChanges = std::array<std::vector<ChangedRule>, 4>;
 
 WhitelistChanges compareWhitelists(const plist::Value& before, const plist::Value& after);

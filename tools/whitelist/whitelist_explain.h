@@ -15,8 +15,8 @@
 
 namespace tavrel {
 
-/// A value whose coarsening to show: as a scalar when it is a 64-bit integer, and as a value of a
-/// distribution.
+/// A value whose coarsening is to be shown: as a scalar when it is a 64-bit integer, and as
+/// a value of a distribution.
 struct ExampleValue {
   std::optional<std::int64_t> scalar;
   double real = 0;
@@ -28,9 +28,9 @@ struct KindExplanation {
   WhitelistDecision::Rule rule = WhitelistDecision::Rule::None;
   std::string group;
   std::string prefix;
-  /// As the daemon finds them; an empty handle when the key is not reported.
+  /// The options that the daemon finds; an empty handle when the key is not reported.
   plist::Dictionary options;
-  /// The group whose rule would decide if it were loaded, and why it is not loaded.
+  /// The group whose rule would decide if the group were loaded, and why it is not.
   std::string idleGroup;
   std::string idleReason;
 };
@@ -44,8 +44,8 @@ struct KeyExplanation {
   std::optional<std::string> bucket;  // label of the example's histogram bucket
 };
 
-/// Queries the daemon's own configuration, made from `bytes`, and finds the rules in `whitelist`,
-/// the value of the same bytes.
+/// Queries the daemon's own configuration, made from `bytes`, and looks up the rules in
+/// `whitelist`, which must be the value that `bytes` encode.
 Expected<std::vector<KeyExplanation>> explainKeys(LinuxPlatform& device, const std::string& bytes,
                                                   const plist::Value& whitelist,
                                                   const std::vector<std::string>& keys,

@@ -1,7 +1,7 @@
 // The whitelist as its author wrote it: each rule with its group and table.
 //
-// The daemon keeps only the union of the groups; this model keeps the origin of each rule, so that
-// the tool can say which one decides and which have no effect.
+// The daemon keeps only the union of the groups. This model keeps the origin of each rule, so that
+// the tool can say which rule decides and which have no effect.
 //
 //   const WhitelistModel model(*decoded);
 //   const WhitelistDecisions decisions(model, isInternal, isLoaded);
@@ -41,18 +41,18 @@ constexpr bool isDistributionTable(WhitelistTable table) {
 struct WhitelistRule {
   WhitelistTable table;
   std::string_view group;
-  std::string_view key;  // or prefix
+  std::string_view key;  // or a prefix
   plist::Dictionary options;
 };
 
-/// The place of a rule in the file, in the form of findings: "Group/ScalarKeys/key". Long names are
-/// cut.
+/// The place of a rule in the file, as findings show it: "Group/ScalarKeys/key".
+/// Long names are shortened.
 std::string pathOfRule(const WhitelistRule& rule);
 std::string shownName(std::string_view name);
 
 class WhitelistModel {
  public:
-  /// Leaves out rules whose type prevents loading.
+  /// Ignores rules whose type prevents loading.
   explicit WhitelistModel(plist::Value whitelist);
 
   /// The rules of a table in the order in which the daemon loads them.
@@ -65,7 +65,7 @@ class WhitelistModel {
   std::array<std::vector<WhitelistRule>, kWhitelistTables.size()> rules_;
 };
 
-/// How the whitelist decides about one key.
+/// What the whitelist decides about one key.
 struct WhitelistDecision {
   enum class Rule : std::uint8_t { None, Exact, Prefix, Internal };
   Rule rule = Rule::None;
@@ -73,8 +73,8 @@ struct WhitelistDecision {
   std::string_view prefix;
 };
 
-/// Finds the deciding rule of keys, in time that does not depend on the number of rules. The model
-/// must outlive it.
+/// Finds the rule that decides about a key, in time that does not depend on the number of rules.
+/// The model must outlive it.
 class WhitelistDecisions {
  public:
   /// `isLoaded` says whether the daemon loads a group of this name.

@@ -1,5 +1,5 @@
-// The rules of one kind of statistics that decide on a device that is not internal, with all groups
-// switched on.
+// The rules that decide about one kind of statistics on a device that is not internal,
+// with all groups switched on.
 #pragma once
 
 #include <string_view>
@@ -15,12 +15,12 @@ class WhitelistRules {
  public:
   using Rules = std::unordered_map<std::string_view, const WhitelistRule*>;
 
-  /// `isDistribution`: of distributions, otherwise of scalars.
+  /// `isDistribution` selects the rules of distributions; otherwise those of scalars.
   WhitelistRules(const WhitelistModel& model, bool isDistribution);
 
   /// Null when the key does not leave the device.
   const WhitelistRule* ofKey(std::string_view key) const;
-  /// Of the keys that begin with `prefix` and neither are listed nor begin with a longer prefix.
+  /// For keys that begin with `prefix` but neither are listed nor begin with a longer prefix.
   const WhitelistRule* ofKeysBeginningWith(std::string_view prefix) const;
 
   /// By key, and by prefix.

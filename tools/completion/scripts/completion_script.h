@@ -1,4 +1,4 @@
-// Completion scripts of shells, generated from the commands, so that they fit them always.
+// Generates shell completion scripts from the commands, so that they always match.
 #pragma once
 
 #include <string>
@@ -10,40 +10,40 @@
 
 namespace tavrel {
 
-/// What the scripts need to know of a program.
+/// What the scripts need to know about a program.
 struct CompletedProgram {
   CommandModel model;
-  /// The option that may stand anywhere on the line and changes what values there are.
+  /// The option that is allowed anywhere on the line and determines which values exist.
   std::string anywhere;
-  /// What `PROGRAM completion LIST` lists, by the name of the value in the help.
+  /// The LIST of `PROGRAM completion LIST` that has the values, by the value's name in the help.
   std::vector<std::pair<std::string_view, std::string_view>> lists = {};
-  /// The same for some commands, by the beginnings of their paths; they come first.
+  /// The same for commands whose paths begin with `path`; these take precedence.
   struct Exception {
     std::string_view path, value, list;
   };
   std::vector<Exception> exceptions = {};
 
   const std::string& name() const { return model.name; }
-  /// The beginning of its names in scripts: "tavrel_fleet".
+  /// The prefix of the program's names in scripts: "tavrel_fleet".
   std::string identifier() const;
   const OptionModel& anywhereOption() const;
 
-  /// What completes a value: "files", "folders", "none", or a list.
+  /// How a value is completed: "files", "folders", "none", or the name of a list.
   std::string_view valueKind(const CommandModel& command, const OptionModel& option) const;
 };
 
-/// `text` with the program's name for @program@, its identifier for @id@ and the option that may
-/// stand anywhere for @anywhere@.
+/// `text` with @program@ replaced by the program's name, @id@ by its identifier, and @anywhere@ by
+/// the option that is allowed anywhere.
 std::string filledIn(std::string_view text, const CompletedProgram& program);
 
 std::string bashScript(const CompletedProgram& program);
 std::string zshScript(const CompletedProgram& program);
 std::string fishScript(const CompletedProgram& program);
 
-/// `text` in single quotes, with `escape` for a single quote in it.
+/// `text` in single quotes; `escape` replaces each single quote within it.
 std::string shellQuoted(std::string_view text, std::string_view escape = "'\\''");
 
-/// Words with a blank between them.
+/// Joins words with blanks.
 std::string joined(const std::vector<std::string>& words);
 
 }  // namespace tavrel

@@ -1,4 +1,4 @@
-// A manual page from prose, with usage lines and option tables made from the commands.
+// Makes a manual page from prose, with usage lines and option tables taken from the commands.
 #pragma once
 
 #include <string>
@@ -12,10 +12,10 @@ namespace tavrel {
 
 /// Lines of the template that begin with "@":
 ///
-///   @command log list    the usage of a command; several in a row share what follows. After the
-///                        prose, before the next of these lines or the next heading, come their
-///                        options, but for --json
-///   @others TITLE        under that heading, the commands that have no line of their own
+///   @command log list    the usage of a command. Several of these lines in a row share the prose
+///                        that follows. Their options, except --json, come after that prose, before
+///                        the next such line or heading
+///   @others TITLE        under that heading, the commands without a line of their own
 ///
 /// Fails on a command that the program does not have.
 Expected<std::string> manPage(std::string_view pageTemplate, const CommandModel& program);
