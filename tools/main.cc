@@ -9,7 +9,7 @@ int main(int argc, char** argv) try {
   return tavrel::runTavrelctl(std::vector<std::string>(argv + 1, argv + argc),
                               tavrel::standardStreams());
 } catch (const std::exception&) {
-  // What else goes wrong has been said; a message takes memory, of which there is none left.
+  // Other failures have been reported. A formatted message would take memory, and none is left.
   std::fputs("tavrelctl: out of memory\n", stderr);
   return 1;
 }

@@ -53,8 +53,8 @@ struct Subcommand {
   void (*add)(Command top, ToolContext& context);
 };
 
-// In the order of the help. Making them all takes longer than a short command, so a line that names
-// one of them gets only that.
+// In the order of the help. Making all of them takes longer than running a short command, so a line
+// that names one of them gets only that one.
 constexpr Subcommand kSubcommands[] = {
     {"status", addStatusCommand},
     {"allow", addAllowCommand},
@@ -82,10 +82,10 @@ constexpr Subcommand kSubcommands[] = {
     {"page", addPageCommand},
 };
 
-// It describes all other commands, so it comes with them.
+// It describes all other commands, so it needs them as well.
 constexpr std::string_view kCompletion = "completion";
 
-// The first argument that is neither an option nor the folder of --root; empty when there is none.
+// The first argument that is neither an option nor the value of --root; empty when there is none.
 std::string_view firstWord(const std::vector<std::string>& arguments) {
   for (std::size_t i = 0; i < arguments.size(); ++i) {
     if (arguments[i] == "--root") {

@@ -37,8 +37,8 @@ std::string textOf(std::string_view known) {
   return std::string(known.empty() ? "not known" : known);
 }
 
-// What is no key of a statistic may be the name of a controller's and of channels of several
-// drivers.
+// A name that is not the key of a statistic may belong to a controller, or to
+// channels of several drivers.
 std::vector<Found> findAll(const std::string& key) {
   std::vector<Found> found;
   const auto take = [&](const KindText& kind, const Entry* entry) {

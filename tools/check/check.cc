@@ -76,7 +76,7 @@ CheckState gravest(const std::vector<Check>& checks) {
   return state;
 }
 
-// In JSON, names are in lower case.
+// JSON has the names in lower case.
 std::string jsonNameOf(CheckState state) {
   std::string name(nameOf(state));
   for (char& letter : name)
@@ -114,7 +114,7 @@ void print(ToolContext& context, const std::vector<Check>& checks) {
 }  // namespace
 
 void showChecks(ToolContext& context) {
-  // Whoever watches must not take a failure of this tool for a warning.
+  // A failure of this tool must not look like a warning to a monitoring system.
   try {
     const std::vector<Check> checks = checkDevice(context, kThoroughExamination);
     const CheckState state = gravest(checks);

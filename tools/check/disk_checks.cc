@@ -1,4 +1,4 @@
-// The health of the drives, as it was last read.
+// The health of the drives, according to their latest readings.
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "tools/check/checks.h"

@@ -1,4 +1,4 @@
-// Logs that wait, and what the uploader could not do.
+// Logs that are waiting, and failures of the uploader.
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/quantity_text.h"
@@ -29,8 +29,8 @@ constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission/";
 constexpr std::string_view kStateFile = "/var/lib/tavrel/upload/state.plist";
 
 enum class Meaning : std::uint8_t {
-  Moves,    // its logs go on within days
-  Rests,    // its logs stay, and nothing is wrong
+  Moves,    // its logs should move on within days
+  Rests,    // its logs may stay without anything being wrong
   Refused,  // each log in it is a failure
 };
 
@@ -89,7 +89,7 @@ void judgeUpload(CheckScene& scene, const plist::Dictionary& state, Check& check
   check.text =
       success ? format("a log was last sent %s ago", ageText(scene.ageOf(*success))) : "never sent";
   if (!failed || failed->int64() <= 0) return;
-  // Without a success it has never worked.
+  // Without a single success, it has never worked.
   check.state = success ? stateOfAge(scene.ageOf(*success)) : CheckState::Warning;
   check.text += format(
       "; %s failed%s: %s", counted(static_cast<std::uint64_t>(failed->int64()), "attempt"),

@@ -1,4 +1,4 @@
-// What programs record: limits that were reached, values that were lost, and folds.
+// What programs record: limits reached, values lost, and folding.
 #include <algorithm>
 #include <cerrno>
 #include <ctime>
@@ -43,7 +43,7 @@ struct Counter {
       text += format("%s%s %lld", text.empty() ? "" : ", ", key.substr(prefix.size()), value);
   }
 
-  /// `gap`: why some of it may not have been seen; empty when all was.
+  /// `gap`: why some of it may have been missed; empty when nothing was.
   Check check(std::string_view name, std::string_view whenNone, const CheckFigureKind& kind,
               const std::string& gap) const {
     if (sum == 0 && !gap.empty()) return {name, "", CheckState::Unknown, gap};
@@ -75,7 +75,7 @@ bool isClosed(const std::string& path) {
   return access(path.c_str(), R_OK) != 0 && errno == EACCES;
 }
 
-// Why the limits may not be kept: a fault of their file, or what the last tidy could not do.
+// Why limits may not be enforced: a fault in their file, or a failure of the last tidy.
 void judgeTidying(CheckScene& scene, Check& check) {
   LinuxPlatform& device = scene.context.linuxPlatform();
   const auto limits =
@@ -108,7 +108,7 @@ void checkCounters(CheckScene& scene, const Recorders& recorders,
   const std::string_view expired = kKeptKinds[static_cast<std::size_t>(Kept::Store)].statistic;
   const Status read = history ? history->walkScalars([&](std::string_view key, std::int32_t,
                                                          std::int64_t value, bool&) {
-    // A store as old as its limit gives up a day each day, which is as it should be.
+    // A store as old as its limit loses one day each day, as intended.
     if (key != expired) reached.add(key, value);
     lost.add(key, value);
   })
@@ -124,8 +124,8 @@ void checkCounters(CheckScene& scene, const Recorders& recorders,
   scene.checks.push_back(lost.check("lost-values", "none", kLost, gap));
 }
 
-// Since a fold last took values. Everything that waits is gone at the next start of the system, so
-// no value is older than that.
+// Seconds since a fold last took values. A restart of the system discards everything that waits, so
+// no value is older than the uptime.
 std::int64_t longestWait(const CheckScene& scene) {
   timespec uptime{};
   clock_gettime(CLOCK_BOOTTIME, &uptime);
@@ -189,7 +189,7 @@ void checkRecording(CheckScene& scene) {
   const auto folder = SegmentFolder::open(root);
   checkCounters(scene, recorders, folder);
   if (!folder) {
-    // Another user than root may not look.
+    // Only root may look into the folder.
     const bool isUnseen = access(root.path("/run/tavrel/stat").c_str(), R_OK) != 0;
     const auto state = isUnseen ? CheckState::Unknown : CheckState::Critical;
     scene.checks.push_back({"folding", "", state, folder.error().message});

@@ -1,4 +1,4 @@
-// Permission, clock, the last run and its log.
+// Permission, clock, and the last run with its log.
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
@@ -24,7 +24,7 @@ constexpr CheckFigureKind kRunTime{"finished_timestamp_seconds",
 constexpr CheckFigureKind kRunErrors{"errors", "tavrel_last_run_errors", "",
                                      "Errors that the last run logged."};
 
-// A run takes seconds; one that still runs after this waits for something.
+// A run takes seconds; one that takes longer than this is stuck.
 constexpr std::int64_t kLongRun = 3600;
 
 Check lastRunCheck(CheckScene& scene, const LastRun& run) {
@@ -35,7 +35,7 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
   }
   check.figures.push_back({&kRunErrors, static_cast<double>(run.errorCount)});
   const std::string age = ageText(scene.ageOf(run.began));
-  // A run of today's tasks is forced, too; the day tells it from one of yesterday's.
+  // A run of today's tasks counts as forced, too; only the day tells the two apart.
   std::string what = run.task == "service" ? "the service's run"
                      : run.task == "daily" ? "the daily run"
                                            : "the forced run";
@@ -65,7 +65,7 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
 CheckState stateOf(LogOutcome outcome) {
   switch (outcome) {
     case LogOutcome::Filed:
-    case LogOutcome::NotPermitted:  // the owner's decision, which the permission tells
+    case LogOutcome::NotPermitted:  // the owner's decision, which the permission check shows
       return CheckState::Ok;
     case LogOutcome::NoWhitelist:
     case LogOutcome::NothingToReport:
@@ -154,7 +154,7 @@ void checkLastLog(CheckScene& scene) {
     check.state = CheckState::Unknown;
     check.text = "preferences cannot be read";
   }
-  // A device that sends nothing needs no whitelist, but a faulty one is somebody's mistake.
+  // A device that sends nothing needs no whitelist, but a faulty whitelist is a mistake even there.
   const WhitelistState& whitelist = conclusion.whitelist;
   if (!whitelist.fault.empty() &&
       !(whitelist.isMissing && conclusion.outcome == LogOutcome::NotPermitted)) {

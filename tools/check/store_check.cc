@@ -1,4 +1,4 @@
-// The statistics store: whether it can be read, is sound, and has room.
+// The statistics store: whether it is readable and sound, and has room.
 #include <algorithm>
 #include <cerrno>
 #include <cmath>
@@ -25,10 +25,10 @@ constexpr CheckFigureKind kFree{"free_bytes", "tavrel_store_free_bytes", "bytes"
 constexpr CheckFigureKind kSetAside{"set_aside", "tavrel_store_set_aside", "",
                                     "Damaged stores that were set aside and are still there."};
 
-// Below this a run may not find room for its log and the store's.
+// With less than this, a run may find no room for its log and the store's.
 constexpr double kLittleSpace = 4 << 20;
 
-// What the store may take beyond its limit: its log, which is emptied at 1 MiB and more.
+// How far the store may exceed its limit: by its log, which is emptied beyond 1 MiB.
 constexpr double kBeyondLimit = 4 << 20;
 
 void checkSize(CheckScene& scene, const std::string& path, Check& check) {
@@ -42,7 +42,7 @@ void checkSize(CheckScene& scene, const std::string& path, Check& check) {
   LinuxPlatform& device = scene.context.linuxPlatform();
   const auto limits = DeviceLimits::read(scene.context.root(), device.fileSystem(),
                                          device.platform().propertyLists);
-  // A fault of the limits has a line of its own.
+  // A fault in the limits has its own line.
   const double limit = limits ? static_cast<double>(limits->of(Kept::Store).bytes) : HUGE_VAL;
   if (size > limit + kBeyondLimit) {
     addFinding(check, CheckState::Warning, "more than the limit of " + sizeText(limit));
@@ -73,7 +73,7 @@ void examine(CheckScene& scene, const std::string& path, Check& check) {
              found->isWhole ? "no damage" : "no damage in the part that there was time for");
 }
 
-// Files beside the store that somebody should look at.
+// Files next to the store that need attention.
 void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
   const std::filesystem::path file(path);
   const auto names = scene.context.linuxPlatform().fileSystem().list(file.parent_path().string());

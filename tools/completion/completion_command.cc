@@ -18,8 +18,8 @@
 namespace tavrel {
 namespace {
 
-// Names go to shells. Those with other characters are left out, so that no quoting is needed and no
-// key that somebody recorded means anything to a shell.
+// Names go to shells. Only those of harmless characters are printed: they need no quoting, and no
+// key that somebody recorded can mean anything to a shell.
 void printWord(ToolContext& context, std::string_view word) {
   const bool isPlain =
       !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
@@ -30,7 +30,7 @@ void printWord(ToolContext& context, std::string_view word) {
   if (isPlain) context.out() << word << '\n';
 }
 
-// Of the last two days with values: a walk over all days would take too long.
+// Lists the keys of yesterday and today only: a walk over all days would take too long.
 void listKeys(ToolContext& context) {
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
   auto history = openRecorded(
@@ -83,7 +83,7 @@ CompletedProgram completedProgram(const Command& program) {
   return {.model = modelOf(program),
           .anywhere = "--root",
           .lists = {{"DAY", "days"}, {"KEY", "keys"}, {"PREFIX", "keys"}, {"DOMAIN", "domains"}},
-          // Keys of preferences are not those of statistics.
+          // Keys of preferences are not keys of statistics.
           .exceptions = {{"prefs", "KEY", "none"}, {"log show", "FILE", "logs"}}};
 }
 

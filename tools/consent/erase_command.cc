@@ -27,7 +27,7 @@ struct Arguments {
   bool yes = false;
 };
 
-/// What is to go. Records belong to days, and logs to no single one.
+/// What to erase. Records belong to days; a log does not belong to a single day.
 struct Scope {
   RowRange rows;
   bool records = false;
@@ -42,7 +42,7 @@ struct Erased {
   std::size_t logs = 0;
 };
 
-/// Nothing after a message about the arguments.
+/// Nothing when the arguments are wrong, after a message.
 std::optional<Scope> scopeOf(ToolContext& context, const Arguments& given) {
   const bool hasDays = !given.from.empty() || !given.to.empty();
   const bool hasPrefix = !given.prefix.empty();
@@ -97,8 +97,8 @@ bool isConfirmed(ToolContext& context, const Scope& scope, bool yes) {
   return false;
 }
 
-/// Moves what programs recorded into the store, however many folds that takes. Fails when a fold
-/// leaves as much as the one before: that has to wait for something else.
+/// Moves what programs recorded into the store, in as many folds as that takes. Fails when a fold
+/// leaves as much as the previous one: something else must happen first.
 Status foldEverything(ToolContext& context) {
   std::uint64_t before = std::numeric_limits<std::uint64_t>::max();
   while (true) {
@@ -112,7 +112,7 @@ Status foldEverything(ToolContext& context) {
   }
 }
 
-/// Removes the files of a folder that `isMeant`, and counts them.
+/// Removes the files of a folder for which `isMeant` returns true, and counts them.
 template <class IsMeant>
 Expected<std::size_t> removeFiles(FileSystem& files, const std::string& folder, IsMeant isMeant) {
   const auto names = files.list(folder);
@@ -137,14 +137,14 @@ Expected<std::size_t> removeRecords(ToolContext& context, const RowRange& range)
                      });
 }
 
-/// Damaged stores, and damaged files of kept values.
+/// Damaged stores, and damaged files of kept values, that were set aside.
 bool isSetAside(const std::string& name, const std::string& store) {
   return name.starts_with(store + ".corrupt-") || name == store + "-kept-damaged";
 }
 
-/// Everything in turn; a failure ends it, and the next call does the rest. Only what cannot be
-/// folded keeps nothing else. Logs go last: a run that begins when the rows are gone makes none of
-/// them.
+/// Erases in steps. A failure ends it, and the next call does the rest; only values that cannot be
+/// folded do not stop the other steps. Logs go last: a run that begins after the rows are gone
+/// makes no new ones from them.
 Status erase(ToolContext& context, const Scope& scope, Erased& erased) {
   LinuxPlatform& device = context.linuxPlatform();
   const Status folded = foldEverything(context);
@@ -241,7 +241,7 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const Erased& erase
   }
 }
 
-// An empty variable of a script must not mean all days.
+// An empty variable in a script must not mean all days.
 std::string namesADay(const std::string& text) {
   return text.empty() ? "names no day" : "";
 }

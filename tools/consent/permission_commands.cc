@@ -26,7 +26,7 @@ struct AllowArguments {
   std::string from;
 };
 
-/// The latest day of which anything is recorded, wherever that is; nothing when nothing is.
+/// The latest day for which anything is recorded, anywhere; nothing when nothing is.
 Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
   Platform& platform = context.platform();
   const Recorders recorders = Recorders::read(context.root(), context.linuxPlatform().fileSystem(),
@@ -52,8 +52,8 @@ Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
   return latest;
 }
 
-/// The first day of a permission that is given now: nothing of it has been recorded yet, even when
-/// the clock was or is wrong.
+/// The first day of a permission that is given now: a day for which nothing has been recorded yet,
+/// even if the clock was or is wrong.
 Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today) {
   const auto latest = latestRecordedDay(context);
   if (!latest) {
@@ -96,7 +96,7 @@ void printAlreadyAllowed(ToolContext& context, const SubmissionPermission& permi
   }
 }
 
-/// What else the first log needs.
+/// Mentions what else the first log needs.
 void noteMissingWhitelist(ToolContext& context) {
   const WhitelistState whitelist = whitelistState(context);
   if (whitelist.isMissing) context.note("no log is made yet: " + whitelist.fault);
@@ -118,7 +118,7 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   if (!isNamed) first = firstDayFromNow(context, today);
   if (!first) return context.fail(first.error().message);
 
-  // What waits was permitted; a later first day would withdraw that in part.
+  // Waiting logs were permitted; a later first day would partly withdraw that permission.
   if (stored->isGiven && (!stored->firstDay || *first > *stored->firstDay)) {
     if (!isNamed) return printAlreadyAllowed(context, *stored, today);
     return context.fail(format("submission is already %s: a later day needs 'tavrelctl deny' first",
@@ -151,8 +151,8 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   noteMissingWhitelist(context);
 }
 
-// The switch goes first: from then on nothing is filed or sent, and whatever ends this process, the
-// next run deletes the rest. Where there is no room to write the switch, deleting makes some.
+// The switch goes first: from then on nothing is filed or sent, and should this process be killed,
+// the next run deletes the rest. If there is no room to write the switch, deleting makes some.
 void deny(ToolContext& context) {
   const SubmissionPermission none;
   bool isStored = store(context, none);

@@ -13,12 +13,12 @@ namespace {
 
 struct Form {
   const char* text;     // "a boolean"
-  const char* example;  // of the end of a command line
+  const char* example;  // the value at the end of a command line
   bool (*fits)(const plist::Value& value);
 };
 
-// A day since 1970, or a number of days or of other things: what the daemon reads of both is 32
-// bits.
+// A day since 1970, or a number of days or other things: the daemon reads all
+// of them as 32-bit numbers.
 bool isCount(const plist::Value& value) {
   const auto number = value.number();
   return number && !number->isFloating() && number->int64() >= 0 &&
@@ -46,11 +46,11 @@ constexpr Form kAmplification{"a number above 0 and below 10", "2.5 --float", is
 
 struct KnownPreference {
   std::string_view domain;
-  std::string_view key;  // empty: every other one of the domain
+  std::string_view key;  // empty: every other key of the domain
   const Form& form;
 };
 
-// Those of docs/files.md. In two domains the other keys are named after something that they switch.
+// The list of docs/files.md. In two domains, the other keys are named after what they switch.
 constexpr std::array kKnown = {
     KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionEnabled", kBoolean},
     KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kCount},
@@ -82,7 +82,7 @@ std::string faultOfPreference(std::string_view domain, std::string_view key,
       });
   if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
   const bool isLong = value.dictionary() || value.array() || value.data();
-  // No example whose copy would give the permission.
+  // Give no example that would grant the permission when copied.
   const bool isPermission = known->key.starts_with("DiagnosticSubmission");
   const std::string cure = isPermission ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
                                         : format("give 'tavrelctl prefs set %s %s %s'", domain, key,

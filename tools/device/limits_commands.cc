@@ -56,7 +56,7 @@ void showLimits(ToolContext& context) {
   table.print(context.page());
 }
 
-// Days in the order of the calendar, those that follow each other as one: "3 (…) to 5 (…), 9 (…)".
+// Days in calendar order, with consecutive ones as a range: "3 (…) to 5 (…), 9 (…)".
 std::string daysText(std::vector<std::int32_t> days) {
   std::ranges::sort(days);
   std::string text;

@@ -43,14 +43,14 @@ bool checkDomain(ToolContext& context, const std::string& domain) {
 }
 
 void failAbsent(ToolContext& context, const Arguments& arguments) {
-  // An unreadable domain has been reported.
+  // An unreadable domain has already been reported.
   if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   context.fail(
       format("no preference %s in domain %s: 'tavrelctl prefs list %s' shows what there is",
              arguments.key, arguments.domain, arguments.domain));
 }
 
-// What to say of a change of the permission that 'tavrelctl prefs' makes; empty for other changes.
+// A note on a change of the permission through 'tavrelctl prefs'; empty for other changes.
 std::string permissionNote(const Arguments& arguments, const SubmissionPermission& former,
                            const SubmissionPermission& now) {
   if (arguments.domain != kDiagnosticsDomain) return {};
@@ -70,13 +70,13 @@ std::string permissionNote(const Arguments& arguments, const SubmissionPermissio
   return {};
 }
 
-// Stores a value, null to remove the key. When that cannot be done, a note has said why.
+// Stores a value, or removes the key when the value is null. After a failure, a note has said why.
 bool store(ToolContext& context, const Arguments& arguments, const plist::Value& value) {
   Preferences& preferences = context.preferences();
   const SubmissionPermission former = submissionPermission(preferences);
   preferences.ZTXPreferencesSetValue(arguments.key, value, arguments.domain);
-  // A first day belongs to the permission that 'tavrelctl allow' gave: it goes with that. The
-  // switch alone then counts at once.
+  // A first day belongs to the permission that 'tavrelctl allow' gave, so it is removed together
+  // with that. The switch alone then takes effect at once.
   if (arguments.domain == kDiagnosticsDomain && arguments.key == kSubmissionEnabledKey &&
       !(former.isGiven && value.boolean().value_or(false))) {
     preferences.ZTXPreferencesSetValue(kSubmissionFirstDayKey, {}, kDiagnosticsDomain);
@@ -115,7 +115,7 @@ Expected<plist::Value> valueOf(ToolContext& context, const Arguments& arguments)
   return decodeDocument(arguments.value, "VALUE");
 }
 
-// A permission that was stored as the text "true" permits nothing, so say so.
+// The text "true" stored as the permission permits nothing, so say so.
 void noteTextThatReadsOtherwise(ToolContext& context, const Arguments& arguments) {
   if (arguments.kindGiven) return;
   const std::string& text = arguments.value;
@@ -142,7 +142,7 @@ void set(ToolContext& context, const Arguments& arguments) {
   if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
   const std::string fault = faultOfPreference(arguments.domain, arguments.key, *value);
   if (!fault.empty() && !arguments.force) return context.failUsage(fault);
-  // As it will be read back: for example, dates lose their fraction.
+  // Stores the value as it will be read back: dates, for example, lose their fraction.
   if (store(context, arguments, *plist::readXml(asBytes(*xml)))) {
     noteTextThatReadsOtherwise(context, arguments);
   }

@@ -64,7 +64,7 @@ void printCount(ToolContext& context, const std::string& name, std::uint64_t cou
 }
 
 void wait(ToolContext& context, const std::string& name, const std::string& timeout) {
-  // Longer than any wait; converting more would be undefined.
+  // Longer than any real wait. Converting a larger number would be undefined behaviour.
   constexpr double kLongestSeconds = 1e9;
   double longest = kLongestSeconds;
   if (!timeout.empty()) {
@@ -113,7 +113,7 @@ Expected<plist::Array> appDataOf(const plist::Value& applications) {
     }
     for (const std::string_view entry : {"orbo_id", "arch"}) {
       const plist::Value number = application.get(entry);
-      if (!number) continue;  // the service reads 0
+      if (!number) continue;  // the service reads it as 0
       if (!isInteger(number)) return wrong(entry, "an integer");
       checked.set(entry, number);
     }

@@ -22,13 +22,13 @@
 namespace tavrel {
 namespace {
 
-/// More findings than this say nothing new about a document.
+/// A longer list of findings says nothing new about a document.
 constexpr std::size_t kFindingsShown = 20;
 
-/// A tasking as preferences hold it. Its values may be anything, since others write them too.
+/// A tasking as stored in preferences. Others write these too, so any value may have any type.
 struct Tasking {
   plist::Value identifier;
-  plist::Value system;  // only of an applied one
+  plist::Value system;  // only for an applied one
   plist::Value digest;
   plist::Value payload;
 };
@@ -51,7 +51,7 @@ struct Taskings {
     change = nextTaskingChange(context.platform());
   }
 
-  /// What the next daily run does.
+  /// What the next daily run will do.
   std::string_view nextRun() const {
     switch (change) {
       case TaskingChange::None:
@@ -110,7 +110,7 @@ void print(ToolContext& context, std::string_view title, const Tasking& tasking)
 
 void show(ToolContext& context) {
   const Taskings taskings(context);
-  // Unreadable must not look like absent.
+  // Unreadable preferences must not look like absent ones.
   if (context.hasComplaints()) return context.setExitStatus(kExitFailure);
   if (context.json()) {
     const Json lastUpdate = taskings.lastUpdate ? jsonOf(taskings.lastUpdate) : Json(nullptr);

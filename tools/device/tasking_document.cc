@@ -21,7 +21,7 @@ class Findings {
     lines_.push_back(path + ": " + std::string(message));
   }
 
-  /// The text under `key`, or nothing after a finding.
+  /// The text under `key`; nothing, after adding a finding, when there is none.
   std::optional<std::string_view> requireText(const plist::Dictionary& dictionary,
                                               std::string_view key, const std::string& path) {
     const plist::Value value = dictionary.get(key);
@@ -52,7 +52,7 @@ class Findings {
     }
   }
 
-  /// Preferences are kept as XML.
+  /// Preferences are stored as XML, which cannot hold every text.
   void refuseOtherTexts(const plist::Value& value, const std::string& path) {
     if (hasXmlTextsOnly(value)) return;
     add(path,

@@ -16,7 +16,7 @@ namespace {
 
 using namespace health;
 
-// The first of the named figures that the drive tells.
+// The first of the named figures that the drive provides.
 const std::int64_t* firstOf(const Disk& disk, std::initializer_list<std::string_view> names) {
   for (const std::string_view name : names) {
     if (const std::int64_t* const value = valueOf(disk.reading.figures, name)) return value;

@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// Drives have metrics of their own.
+// Drives have their own metrics.
 constexpr std::string_view kHealthGroup = "Health";
 
 struct UnitName {
@@ -22,7 +22,7 @@ constexpr UnitName kUnits[] = {
     {"bytes", "bytes"}, {"s", "seconds"}, {"W", "watts"},   {"J", "joules"}, {"A", "amperes"},
     {"V", "volts"},     {"F", "farads"},  {"H", "henries"}, {"Hz", "hertz"}, {"°C", "celsius"}};
 
-/// One channel on its way to the page.
+/// Exports one channel to the page.
 class ChannelExport {
  public:
   ChannelExport(const plist::Dictionary& channel, MetricPage& page)
@@ -107,7 +107,7 @@ class ChannelExport {
     }
   }
 
-  // The counts of a histogram may not be known, or wrap: it is left out then.
+  // Leaves the histogram out when its counts or bounds are unknown or make no sense.
   void addHistogram() {
     const std::int32_t count = IOReportHistogramGetBucketCount(channel_);
     HistogramPoint point;
@@ -129,7 +129,7 @@ class ChannelExport {
       sum += part.value_or(0);
       point.buckets.emplace_back(*bound, hits);
     }
-    // The last bucket takes everything above the one before.
+    // The last bucket holds everything above the previous one.
     if (!point.buckets.empty())
       point.buckets.back().first = std::numeric_limits<double>::infinity();
     if (isSumKnown) point.sum = sum;
@@ -153,7 +153,7 @@ class ChannelExport {
 }  // namespace
 
 void exportChannels(ToolContext& context, MetricPage& page) {
-  // A device without drivers has none, and nothing is wrong with it.
+  // A device without drivers has no channels, which is not a fault.
   {
     NotingPlatform noting(context);
     const auto published = selectChannels(noting.platform(), {});

@@ -1,4 +1,4 @@
-// Drives, and the device as `status --check` sees it.
+// Drives, and the state of the device as `status --check` sees it.
 #include <algorithm>
 
 #include "platform/linux/health/figure.h"
@@ -11,7 +11,7 @@ namespace {
 
 using namespace health;
 
-// In the time between two scrapes nobody wants to read a large store whole.
+// Reading a large store completely would not fit between two scrapes.
 constexpr std::chrono::milliseconds kExamination{100};
 
 void exportFigures(const Disk& disk, const Figures& figures, std::string_view ending,

@@ -26,8 +26,8 @@ const MetricFamily kMean{"tavrel_distribution_mean", "",
 
 constexpr int kPercents[] = {5, 25, 50, 75, 95, 99};
 
-// Values of a distribution that are sorted in memory. Of longer ones the percentiles are searched
-// for in four more passes.
+// Distributions of up to this many values are sorted in memory. For longer ones, four more passes
+// search for the percentiles.
 constexpr std::size_t kSortedValues = 1U << 20;
 
 class DistributionExport {
@@ -54,7 +54,7 @@ class DistributionExport {
       page_.gauge(kMinimum, labels, summary.minimum());
       page_.gauge(kMaximum, labels, summary.maximum());
       page_.gauge(kMean, labels, summary.mean());
-      // Neither sums nor quantiles of a summary may be negative.
+      // In a summary, neither the sum nor a quantile may be negative.
       if (summary.minimum() >= 0) {
         if (std::isfinite(sum)) point.sum = sum;
         point.quantiles = quantilesOf(key, summary.numbers());
@@ -81,7 +81,7 @@ class DistributionExport {
     return quantiles;
   }
 
-  // Values that were added since change the ranks a little.
+  // Values added since the summary shift the ranks a little.
   std::vector<double> search(std::string_view key, std::int64_t numbers) {
     auto history = openRecorded(
         context_, {.key = std::string(key), .isPrefix = false, .firstDay = day_, .lastDay = day_});
@@ -116,7 +116,7 @@ std::optional<std::int32_t> latestDay(ToolContext& context) {
     return std::nullopt;
   }
   if (!*held) return std::nullopt;
-  // A day that has not come is of a clock that was wrong.
+  // A day in the future stems from a clock that was wrong.
   return std::min((*held)->last, context.platform().statistics->BHDaysSince1970());
 }
 

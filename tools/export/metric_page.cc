@@ -26,14 +26,14 @@ std::string numberOf(double value) {
   return numberText(value);
 }
 
-// A number within a label: whole ones have a fraction, as OpenMetrics wants it.
+// A number within a label: OpenMetrics requires a fraction even for whole ones.
 std::string boundOf(double value) {
   std::string text = numberOf(value);
   if (text.find_first_of(".eIN") == std::string::npos) text += ".0";
   return text;
 }
 
-// Without the braces.
+// The labels without their braces.
 std::string textOf(const MetricLabels& labels) {
   std::string text;
   for (const auto& [name, value] : labels) {
@@ -135,7 +135,7 @@ void MetricPage::histogram(const MetricFamily& family, const MetricLabels& label
     lines +=
         line(family.name + "_bucket", text, std::to_string(count), "le=\"" + boundOf(bound) + "\"");
   }
-  // The one may stand only with the other.
+  // OpenMetrics allows sum and count only together.
   if (point.sum) lines += line(family.name + "_sum", text, numberOf(*point.sum));
   if (point.sum)
     lines += line(family.name + "_count", text, std::to_string(point.buckets.back().second));

@@ -16,14 +16,14 @@
 namespace tavrel {
 namespace {
 
-// The second in which a log was filed, since 1970; without metadata it counts as the oldest.
+// The second since 1970 in which a log was filed; a log without metadata counts as the oldest.
 double secondOf(const FiledLog& log) {
   const auto time = log.metadata.date(kLogMetadataTime);
   return time ? std::floor(time->secondsSince1970()) : -HUGE_VAL;
 }
 
-// The order in which logs were filed. Metadata tells the second, the file the rest; the clock of a
-// file system has steps, within which names decide.
+// The order in which logs were filed. Metadata gives the second, and the file's time refines it.
+// File times advance in steps, within which names decide.
 bool isOlder(const FiledLog& a, const FiledLog& b) {
   const auto order = [](const FiledLog& log) {
     const timespec modified = log.status ? log.status->st_mtim : timespec{};
@@ -32,14 +32,14 @@ bool isOlder(const FiledLog& a, const FiledLog& b) {
   return order(a) < order(b);
 }
 
-// False for a folder, whatever its name. Takes the status.
+// False for a folder, whatever its name. Fills in the status.
 bool isRegular(FiledLog& log) {
   log.status = FileSystem::status(log.path);
   return !log.status || S_ISREG(log.status->st_mode);
 }
 
-// The logs of all folders, as their file names describe them. `unseen` gets the reason why withheld
-// ones cannot be seen; where it is null, a line tells that.
+// The logs of all folders, as their file names describe them. `unseen` receives the reason why
+// withheld ones cannot be seen; when it is null, a note gives the reason.
 Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
                                             std::optional<Error>* unseen = nullptr) {
   using enum FileSubmission::Place;
@@ -47,7 +47,7 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
   std::optional<Error> closed;
   for (const auto place : {Withheld, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
-    // Other users who look at logs do without those that only root may see.
+    // Only root may see withheld logs; other users get the rest.
     if (!found && place == Withheld) {
       closed = found.error();
       continue;
@@ -64,14 +64,14 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
   return logs;
 }
 
-// The second in which a log was filed, as its name tells, otherwise its metadata.
+// The second in which a log was filed, from its name or else its metadata.
 double secondFiled(ToolContext& context, FiledLog& log) {
   if (const auto known = parseLogFileName(log.name)) return static_cast<double>(known->seconds);
   context.linuxPlatform().submission().readMetadata(log);
   return secondOf(log);
 }
 
-// Completes logs, leaves out what is no file, and sorts the rest.
+// Reads each log's metadata, drops entries that are not files, and sorts the rest.
 void readFacts(ToolContext& context, std::vector<FiledLog>& logs) {
   std::erase_if(logs, [](FiledLog& log) { return !isRegular(log); });
   for (FiledLog& log : logs)
@@ -96,7 +96,7 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
   if (!files) return files.error();
   FiledLogs filed{*std::move(files), 0, std::move(unseen)};
   if (filed.logs.size() > most) {
-    // By the place of each, as a log is costly to move.
+    // Sorts positions rather than logs, which are costly to move.
     std::vector<std::pair<double, std::size_t>> seconds;
     seconds.reserve(filed.logs.size());
     for (FiledLog& log : filed.logs)
@@ -160,7 +160,7 @@ Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_vi
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name) {
   auto files = filesOfLogs(context);
   if (!files) return std::nullopt;
-  // A log that is in both folders, for example after a power cut, still waits.
+  // A log in both folders, for example after a power cut, is still waiting.
   const auto found = std::find_if(files->rbegin(), files->rend(), [&](FiledLog& log) {
     return (name == log.path || name == log.name || name == fileNameOf(log)) && isRegular(log);
   });
@@ -182,7 +182,7 @@ void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs
                        : value ? path + ": it is empty or no dictionary"
                                : value.error().message;
   if (bytes && !value) reason = path + ": " + reason;
-  // What is there and cannot be read is a failure; what is missing may be the rest of a kill.
+  // Unreadable metadata is a failure; missing metadata may just be the result of a kill.
   if (isThere || (!bytes && FileSystem::status(path))) context.setExitStatus(kExitFailure);
   context.note(format(
       "%s without metadata: %s",

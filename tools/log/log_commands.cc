@@ -29,7 +29,7 @@
 namespace tavrel {
 namespace {
 
-// Each is read for the day that it reports.
+// Showing the day of a log means reading the log.
 constexpr std::size_t kShownLogs = 100;
 
 struct Arguments {
@@ -40,8 +40,8 @@ struct Arguments {
   bool verbose = false;
 };
 
-/// The log that `name` means: "latest" (of the daily logs), the name of a filed log or its
-/// beginning, or a path of this machine.
+/// The log that `name` identifies: "latest" (of the daily logs), the name of a filed log or the
+/// beginning of one, or a path of this machine.
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   std::optional<FiledLog> found;
   if (name == "latest") {
@@ -61,7 +61,7 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
 }
 
-// Logs of other kinds are texts with their own form.
+// Logs of other kinds are texts in their own formats.
 void showText(ToolContext& context, const LogEnvelope& envelope, std::string_view bytes) {
   if (context.json()) {
     Json log = jsonOfEnvelope(envelope);
@@ -132,7 +132,7 @@ void preview(ToolContext& context, const Arguments& arguments) {
     };
   }
   const LogPreview preview = previewLog(context, day, onLine);
-  // An incomplete document must not look like a whole one.
+  // An incomplete document must not pass for a complete one.
   if (!preview.errors.empty()) context.setExitStatus(kExitFailure);
   if (!arguments.verbose) {
     for (const std::string& error : preview.errors)

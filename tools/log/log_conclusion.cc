@@ -35,7 +35,7 @@ WhitelistState whitelistState(ToolContext& context) {
   Platform& platform = context.platform();
   const std::string path = context.root().path(kWhitelistPath);
   WhitelistState state;
-  // As the daemon reads it.
+  // Read it the way the daemon does.
   const auto bytes = platform.files->read(kWhitelistPath, limits::kWhitelistBytes);
   if (!bytes) {
     const int obstacle = access(path.c_str(), R_OK) == 0 ? 0 : errno;

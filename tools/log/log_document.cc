@@ -24,7 +24,7 @@ void printField(const Page& page, std::string_view name, std::string_view text) 
   page.out << format("%-12s  ", name) << printable(text) << '\n';
 }
 
-// A value of the header: texts plain, other values so that they show their kind.
+// A value of the header: texts as they are, other values so that they show their type.
 std::string fieldText(const plist::Value& value) {
   if (const auto text = value.string()) return std::string(*text);
   return inlineText(value);
@@ -43,14 +43,14 @@ void printTitle(const Page& page, std::string_view title, std::size_t count) {
   page.out << '\n' << page.styled(format("%s (%zu)", title, count), Emphasis::Strong) << '\n';
 }
 
-// Pairs of keys; the first says how much of the second is free.
+// Pairs of keys: the first is the free part of the second.
 constexpr std::pair<std::string_view, std::string_view> kDisks[] = {
     {"com.norvane.lumenhall.DiskUsageUserBlocksFree",
      "com.norvane.lumenhall.DiskUsageUserTotalBlocks"},
     {"com.norvane.usage.disk.free_mib", "com.norvane.usage.disk.total_mib"},
 };
 
-// A disk with a smaller free share than this is marked.
+// A disk whose free share is smaller than this is marked.
 constexpr double kShortShare = 0.1;
 
 Emphasis emphasisOf(const plist::Entry& entry, const plist::Dictionary& values) {

@@ -15,7 +15,7 @@ using plist::Kind;
 
 struct Member {
   std::string_view key;
-  Kind kind;  // null for any
+  Kind kind;  // null for any kind
   std::string_view kindText;
 };
 

@@ -21,7 +21,7 @@
 namespace tavrel {
 namespace {
 
-// Metadata does not hold the day that a log reports. `unread` gets the first failure to read one.
+// Metadata lacks the reported day, so reads the log. `unread` gets the first failure.
 std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
                                     std::optional<Error>& unread) {
   if (!log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName)) {
@@ -34,7 +34,7 @@ std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
   return bytes ? dayOfLog(*bytes, propertyLists) : std::nullopt;
 }
 
-// Nothing records whether a run was forced, but a gated run reports the day before its own.
+// Nothing records whether a run was forced, but a gated run always reports the previous day.
 bool isSurelyForced(const FiledLog& log, std::optional<std::int32_t> day) {
   const auto filed = log.metadata.date(kLogMetadataTime);
   if (!day || !filed) return false;

@@ -16,7 +16,7 @@ LogPreview previewLog(
     if (event.kind != OverlayEvent::Kind::LogLine) return;
     const std::string_view message = *event.value.string();
     if (onLine) onLine(event.subject, message);
-    // What the daemon says of a histogram that it leaves out is no error for it.
+    // A left-out histogram is no error for the daemon, but makes the preview incomplete.
     const bool isFault =
         event.subject == "error" || message.starts_with("Couldn't allocate histCounts");
     if (isFault) preview.errors.emplace_back(message);
@@ -32,7 +32,7 @@ LogPreview previewLog(
   if (!preview.errors.empty()) preview.errors.pop_back();
   preview.lacksWhitelist = outcome == LogOutcome::NoWhitelist;
   if (preview.lacksWhitelist) {
-    // The daemon's own lines lack the place, or what to do.
+    // The daemon's own lines do not say where the whitelist is, or what to do.
     std::erase(preview.errors, "Couldn't load whitelist");
     preview.reason = whitelistState(context).fault;
   }

@@ -57,7 +57,7 @@ bool isInGroup(const Group& group, std::string_view key) {
          })->title == group.title;
 }
 
-/// Takes the text up to `end` off the front; all of it when there is none.
+/// Removes the text up to `end` from the front and returns it; takes all when there is no `end`.
 std::string_view takeUntil(std::string_view& text, std::string_view end) {
   const std::size_t at = std::min(text.find(end), text.size());
   const std::string_view taken = text.substr(0, at);
@@ -65,8 +65,8 @@ std::string_view takeUntil(std::string_view& text, std::string_view end) {
   return taken;
 }
 
-/// The header, a blank line, and "DATE TIME ZONE PROCESS[ID]: KEY:VALUE;...". Nothing for other
-/// texts.
+/// A header, a blank line, and "DATE TIME ZONE PROCESS[ID]: KEY:VALUE;...".
+/// Nothing for any other text.
 std::optional<NandLog> parseNandLog(std::string_view text) {
   NandLog log;
   while (!text.empty()) {
@@ -85,7 +85,7 @@ std::optional<NandLog> parseNandLog(std::string_view text) {
   std::string_view body = takeUntil(text, "\n");
   while (!body.empty()) {
     const std::string_view item = takeUntil(body, ";");
-    // Values have no colon; keys may have one.
+    // Values contain no colon, but keys may.
     const std::size_t colon = std::min(item.rfind(':'), item.size());
     log.items.emplace_back(item.substr(0, colon), item.substr(std::min(colon + 1, item.size())));
   }
@@ -94,7 +94,7 @@ std::optional<NandLog> parseNandLog(std::string_view text) {
 
 /// When the next log may be written.
 struct NextLog {
-  bool isKnown = true;  // not when preferences cannot be read
+  bool isKnown = true;  // false when preferences cannot be read
   std::optional<plist::Date> last;
   std::optional<plist::Date> from;  // nothing means at the next run
   bool isLastInFuture = false;
@@ -138,7 +138,7 @@ Json jsonOf(const NextLog& next) {
           {"allowed_from", next.from ? Json(isoDateText(*next.from)) : Json(nullptr)}};
 }
 
-/// A number, or another text unchanged.
+/// A number when the text is one, otherwise the text itself.
 Json jsonOfNumber(std::string_view text) {
   Json number = Json::parse(text, nullptr, false);
   return number.is_number() ? number : Json(text);
@@ -198,7 +198,7 @@ void print(ToolContext& context, const LogEnvelope& envelope, const NandLog& log
   out << '\n';
 }
 
-// Without metadata, for example when it may not be read, the file name decides.
+// Without metadata, for example when it is unreadable, the file name decides.
 bool isNandLog(const FiledLog& log) {
   if (log.metadata.empty()) return log.name.starts_with(kNandLogName);
   return log.metadata.string(kLogMetadataName) == kNandLogName &&

@@ -42,7 +42,7 @@ std::optional<unsigned> hexDigit(char c) {
   return static_cast<unsigned>(at);
 }
 
-/// The name of an element of a statistic, as `nand parse` lists arrays.
+/// An element of a statistic, named as in the arrays that `nand parse` lists.
 struct Element {
   const StatisticKey* statistic;
   std::uint32_t index;
@@ -70,10 +70,10 @@ class Builder {
   std::string take() { return std::move(bytes_); }
 
  private:
-  /// Consecutive elements share a record; this is the one that may continue.
+  /// Consecutive elements share a record; this is the record that may be continued.
   struct Run {
     const StatisticKey* statistic = nullptr;
-    std::size_t recordAt = 0;  // in the bytes
+    std::size_t recordAt = 0;  // offset in the bytes
     std::uint32_t count = 0;   // values so far
   };
 
@@ -207,7 +207,7 @@ class Builder {
   Run run_;
 };
 
-// The members of what `nand parse --json` prints; only the entries make the buffer.
+// The members that `nand parse --json` prints. Only the entries determine the buffer.
 bool isKnownMember(std::string_view name) {
   return name == "entries" || name == "format_version" || name == "result" || name == "fields";
 }

@@ -35,7 +35,7 @@ namespace {
 
 struct Arguments {
   std::string file;
-  std::string other;  // of --diff, --descriptor
+  std::string other;  // for --diff and --descriptor
   std::string chipId;
   std::string manufacturerId;
   std::string output;
@@ -46,7 +46,7 @@ std::string nameOf(const std::string& file) {
   return file == "-" ? "standard input" : file;
 }
 
-// Whether both files are standard input, which can be read only once. Says so.
+// Whether both files are standard input, which can be read only once; if so, reports that.
 bool namesInputTwice(ToolContext& context, const Arguments& arguments) {
   if (arguments.file != "-" || arguments.other != "-") return false;
   context.failUsage("standard input can be read only once: give - for one of the files");
@@ -79,8 +79,8 @@ void info(ToolContext& context, const Arguments& arguments) {
                       info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
 }
 
-// A buffer that cannot be parsed is a failure, but the part before the fault is still worth
-// showing.
+// A buffer that cannot be parsed is a failure, but the part before the
+// fault is still worth showing.
 int parseInto(ToolContext& context, const std::string& file, std::string_view bytes,
               ASPContext& statistics) {
   const int result = ASPParseBufferToCxt(statistics, asBytes(bytes));

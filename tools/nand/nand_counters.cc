@@ -23,7 +23,7 @@ void printBins(const Page& page, std::span<const std::uint32_t> counters) {
   printBuckets(page, bars);
 }
 
-// The number before a row is that of its first element.
+// Prefixes each row with the number of its first element.
 void printRows(const Page& page, std::span<const std::uint32_t> counters) {
   Table table(std::vector<Table::Column>(1 + kPerRow, {"", Table::Align::Right}), 2);
   for (std::size_t first = 0; first < counters.size(); first += kPerRow) {

@@ -10,9 +10,9 @@
 namespace tavrel {
 namespace {
 
-constexpr std::uint64_t kSectorBytes = 4096;  // of logical traffic
+constexpr std::uint64_t kSectorBytes = 4096;  // the unit of logical traffic
 constexpr std::int64_t kDaysTo2000 = 10957;   // since 1970
-// Fewer keys with one stem are shown one by one.
+// A stem with fewer keys is not a histogram; its keys are shown one by one.
 constexpr std::size_t kFewestBuckets = 3;
 
 constexpr std::uint64_t kMostWeeks = 1'000'000;

@@ -13,8 +13,8 @@ namespace {
 constexpr std::size_t kCharactersPerByte = 4;
 constexpr std::size_t kCharactersOfKey = 4096;
 
-// A device's formats may widen each field to a page, and its records may coincide. There is room
-// for the whole text of the largest buffer of the fixed layout.
+// A device's formats may widen each field to a page, and its records may overlap. The whole text of
+// the largest buffer in the fixed layout fits.
 constexpr std::size_t kLongestText = 320U << 20;
 
 class Taken final : public StackSnapshot {
@@ -31,7 +31,7 @@ class Taken final : public StackSnapshot {
 }  // namespace
 
 Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor) {
-  // The renderer has the same result for a text that does not fit and a descriptor that it refuses.
+  // The renderer does not distinguish a refused descriptor from a text that does not fit.
   if (descriptor) {
     const auto checked = readSnapshotDescriptor(*descriptor, records.size());
     if (!checked) return checked.error();

@@ -24,11 +24,11 @@ struct Record {
 
   std::size_t count() const { return values.size() / kUnitBytes; }
   std::uint64_t value(std::size_t i) const { return *loadLittle64(values, i * kUnitBytes); }
-  /// Whether the parser lists all of it: under its name, one value per entry.
+  /// Whether the parser lists the whole record: under its name, one value per entry.
   bool isListed() const { return statistic && count() > 0 && count() <= statistic->cap; }
 };
 
-// Walks the records up to the first broken one, and says what is wrong with that.
+// Walks the records up to the first broken one, and returns what is wrong with that one.
 template <class Visit>
 std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
   const std::uint64_t end = buffer.size() / kUnitBytes * kUnitBytes;
@@ -53,11 +53,11 @@ std::optional<std::string> forEachRecord(ByteSpan buffer, Visit visit) {
   return std::nullopt;
 }
 
-// The form that `nand build` reads. What the parser does not list becomes a record of its own, so
-// that nothing is lost.
+// The form that `nand build` reads. A record that the parser does not list becomes an entry of its
+// own, so that nothing is lost.
 void addEntries(JsonList& entries, const Record& record) {
   if (!record.isListed()) {
-    // A record may fill the whole buffer; as text it needs no more than its digits.
+    // A record may fill the whole buffer; written as text, it needs memory only for its digits.
     const Json key = record.statistic ? Json(record.statistic->name) : Json(record.key);
     std::string text = format("{\"key\": %s, \"values\": [", key.dump());
     for (std::size_t i = 0; i < record.count(); ++i)
@@ -76,7 +76,7 @@ struct Row {
   std::size_t position;  // in the buffer
 };
 
-// By name; those of one name in the order of the buffer.
+// By name; entries of the same name keep the order of the buffer.
 std::vector<Row> sortedRows(const ASPContext& context) {
   std::vector<Row> rows;
   forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {

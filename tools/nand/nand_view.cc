@@ -23,12 +23,12 @@
 namespace tavrel {
 namespace {
 
-// A flash with a smaller free share than this is marked.
+// A flash whose free share is smaller than this is marked.
 constexpr double kShortShare = 0.05;
 
 struct Group {
   std::string_view title;
-  std::span<const std::string_view> keys;  // "E2E_*": all that begin so, by name
+  std::span<const std::string_view> keys;  // "E2E_*": all keys with that prefix, by name
 };
 
 constexpr std::string_view kDevice[] = {"ExportVersion",       "DriverVersion", "DemoMode",
@@ -124,7 +124,7 @@ class View {
     page_.out << page_.styled(printable(text), Emphasis::Strong) << '\n';
   }
 
-  // Prints the keys that exist and were not printed yet.
+  // Prints the keys that exist and have not been printed yet.
   void printGroup(const Group& group) {
     Table table({{"", Table::Align::Whole}, {"", Table::Align::Right}, {""}}, 2);
     for (const std::string_view key : group.keys) {

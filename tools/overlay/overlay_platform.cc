@@ -16,7 +16,7 @@
 namespace tavrel {
 namespace {
 
-// The services below an overlay cannot change a file, even by mistake.
+// Makes sure that the services below an overlay cannot change a file, not even by mistake.
 class ReadOnlyFileSystem final : public FileSystem {
  protected:
   int openFile(const char* path, int flags, mode_t mode) override {
@@ -37,7 +37,7 @@ class ReadOnlyFileSystem final : public FileSystem {
 
 }  // namespace
 
-// It has a platform of its own below, so that messages of those services go to the overlay too.
+// Gives the services below a platform of their own, so that their messages go to the overlay, too.
 struct OverlayPlatform::Services {
   explicit Services(LinuxPlatform& device) : root(device.root()) {
     platform.applications = applications;

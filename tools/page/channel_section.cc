@@ -1,4 +1,4 @@
-// Report channels that tell how long the states of something lasted.
+// Report channels that measure how long states lasted.
 #include <cmath>
 
 #include "base/format.h"
@@ -15,14 +15,14 @@ namespace tavrel {
 namespace {
 
 constexpr SectionLimit kChannelLimit{150, 200'000};
-// Of one channel; the others are summed up.
+// States shown per channel; the others are summed up.
 constexpr std::size_t kStates = 24;
 
 std::string_view textOr(std::optional<std::string_view> text) {
   return text.value_or(std::string_view());
 }
 
-// Nothing to show is no failure; the sampler names what it cannot sample.
+// Having nothing to show is not a failure; the sampler names what it cannot sample.
 std::vector<plist::Dictionary> sampledStates(ToolContext& context) {
   ReportSelection states;
   states.format = "state";

@@ -1,4 +1,4 @@
-// The device itself: the head of the page, its health, and notes on the page.
+// The device itself: the head of the page, its health, and notes about the page.
 #include <algorithm>
 
 #include "base/format.h"

@@ -1,4 +1,4 @@
-// Drives: their wear, how long they may last, and all that they tell.
+// Drives: their wear, their expected lifetime, and everything else that they report.
 #include <algorithm>
 #include <cmath>
 #include <optional>
@@ -37,14 +37,14 @@ std::optional<Wear> wearOf(const Disk& disk) {
   return wear;
 }
 
-/// Days after which the drive is worn out, if it goes on being worn as it was.
+/// Days until the drive is worn out if wear continues at the same pace.
 std::optional<double> daysLeft(double percentUsed, double inDays, double percentNow) {
   if (percentUsed <= 0 || inDays <= 0) return std::nullopt;
   return std::max(100 - percentNow, 0.0) * inDays / percentUsed;
 }
 
-// Of the figure that the daily run stored, when it grew by so many percent over the days of the
-// page.
+// Extrapolates the figure that the daily run stored, provided it grew by at least `leastGrowth`
+// percent over the days of the page.
 std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear,
                                       std::int64_t leastGrowth) {
   const auto known = scene.recorded.scalars.find(
@@ -75,8 +75,8 @@ std::string lifetimeText(const PageScene& scene, const Disk& disk) {
     if (!days) return std::nullopt;
     return format("About %s at the pace of the days on this page", yearsText(*days));
   };
-  // The pace of late says more than that of the whole life, unless it is only a step of a whole
-  // percent or two.
+  // The recent pace is a better guide than that of the whole life, unless it is only a step
+  // or two of a whole percent.
   constexpr std::int64_t kClearGrowth = 3;
   if (const auto text = byTrend(kClearGrowth)) return *text;
   constexpr double kHoursPerDay = 24;

@@ -18,7 +18,7 @@
 namespace tavrel {
 namespace {
 
-// As long as for metrics: nobody waits a second for a page.
+// The same as for metrics: nobody wants to wait a second for a page.
 constexpr std::chrono::milliseconds kExamination{100};
 constexpr std::uint32_t kMostDays = 400;
 

@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// Of one distribution, in memory.
+// How many values of one distribution are sorted in memory.
 constexpr std::size_t kSortedValues = 1U << 20;
 
 DayValues summedUp(std::vector<double>& values, const Summary& summary) {
@@ -27,7 +27,7 @@ DayValues summedUp(std::vector<double>& values, const Summary& summary) {
   return day;
 }
 
-// The last day with statistics; nothing without any.
+// The last day that has statistics; nothing when none has.
 std::optional<std::int32_t> latestDay(const RecordedDays& recorded) {
   std::optional<std::int32_t> latest;
   const auto look = [&](const auto& statistics) {
@@ -43,7 +43,7 @@ class Reader {
  public:
   explicit Reader(ToolContext& context, std::int32_t days) : context_(context), days_(days) {}
 
-  /// What the days up to `last` have.
+  /// Reads the days up to `last`.
   Status readDays(std::int32_t last) {
     recorded_.first = lowInt32(std::max(std::int64_t{last} - days_ + 1, std::int64_t{kFirstDay}));
     recorded_.last = last;
@@ -68,7 +68,7 @@ class Reader {
     });
   }
 
-  /// The same up to yesterday, or, when they have nothing, up to the last day that has.
+  /// Reads up to yesterday or, when that finds nothing, up to the last day that has any.
   Status readLatest() {
     const std::int32_t today = context_.platform().statistics->BHDaysSince1970();
     Status read = readDays(previousDay(today));
@@ -76,14 +76,14 @@ class Reader {
       auto history = openRecorded(context_, {.key = "", .hasValues = false});
       const auto held = history ? history->daysHeld() : history.error();
       if (!held) return held.error();
-      // A day that has not come is of a clock that was wrong.
+      // A day in the future stems from a clock that was wrong.
       if (*held) read = readDays(std::min((*held)->last, today));
     }
     recorded_.day = latestDay(recorded_).value_or(recorded_.last);
     return read;
   }
 
-  /// The values of the day that is shown.
+  /// Reads the values of the day that is shown.
   Status readDay() {
     auto history =
         openRecorded(context_, {.key = "", .firstDay = recorded_.day, .lastDay = recorded_.day});
@@ -101,7 +101,7 @@ class Reader {
       }
       if (enumerator.failed()) return;
       RecordedDistribution& distribution = entryOf(recorded_.distributions, key);
-      // What was recorded since the first look counts as well.
+      // Include what was recorded since the first pass.
       auto& byDay = distribution.days;
       if (!byDay.empty() && byDay.back().first == recorded_.day) byDay.pop_back();
       byDay.emplace_back(recorded_.day, summary);

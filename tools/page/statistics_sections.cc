@@ -1,4 +1,4 @@
-// The statistics of the day, exact and as they leave the device.
+// The statistics of the day, both exact and as they leave the device.
 #include <algorithm>
 #include <cmath>
 
@@ -21,7 +21,7 @@ using page::shortNumber;
 constexpr SectionLimit kScalarLimit{1000, 350'000};
 constexpr SectionLimit kDistributionLimit{100, 350'000};
 
-// What the log's column shows, whatever type the value has.
+// The text for the log's column, whatever the type of the value.
 std::string coarseText(const plist::Value& value) {
   const auto number = value.number();
   if (!number) return textOf(value);
@@ -29,7 +29,7 @@ std::string coarseText(const plist::Value& value) {
   return shortNumber(number->real());
 }
 
-// A scalar of the day and of its log; one of them may be missing.
+// A scalar on that day and in its log; either may be missing.
 struct ScalarRow {
   std::string_view key;
   std::optional<std::int64_t> exact;
@@ -78,7 +78,7 @@ void writeNoDay(const PageScene& scene, page::HtmlWriter& html, std::string_view
                format("The device recorded no %s on %s.", what, dayDateText(scene.recorded.day)));
 }
 
-// What the log of the day means for the figures of a section.
+// Says what the log of the day means for the figures of a section.
 void writeLogState(const PageScene& scene, page::HtmlWriter& html, std::uint64_t leaving,
                    std::uint64_t all, std::string_view what) {
   std::string text;
@@ -218,7 +218,7 @@ void writeDistributions(PageScene& scene) {
       rows.push_back({key, summary, &recorded.values});
   }
   if (rows.empty()) return writeNoDay(scene, html, "distribution");
-  // Those in the log first.
+  // Statistics that are in the log come first.
   const auto others = std::stable_partition(
       rows.begin(), rows.end(), [&](const Row& row) { return leaving.contains(row.key); });
   writeLogState(scene, html, static_cast<std::uint64_t>(others - rows.begin()), rows.size(),

@@ -17,7 +17,7 @@ namespace {
 using Values = std::vector<std::optional<double>>;
 
 constexpr SectionLimit kChartLimit{120, 600'000};
-// Of those beyond, in a table.
+// For trends beyond that, which are rows of a table.
 constexpr SectionLimit kRowLimit{500, 800'000};
 
 /// A statistic over the days of the page: a scalar or a distribution.
@@ -27,7 +27,7 @@ struct Trend {
   const RecordedDistribution* distribution = nullptr;
 };
 
-// Those in the log first.
+// Statistics that are in the log come first.
 std::vector<Trend> trendsOf(const PageScene& scene) {
   std::set<std::string_view> inLog;
   for (const DistributionView& view : scene.log.distributions)
@@ -64,7 +64,7 @@ Values figureOverDays(const RecordedDays& recorded, const ByDay<Summary>& days,
   });
 }
 
-// Of a distribution its means.
+// For a distribution, its means.
 Values valuesOf(const RecordedDays& recorded, const Trend& trend) {
   if (trend.distribution != nullptr)
     return figureOverDays(recorded, trend.distribution->days, &Summary::mean);

@@ -12,8 +12,8 @@
 namespace tavrel {
 namespace {
 
-// Watches the folder or, until it exists, the nearest one above it. Watching a folder twice changes
-// nothing.
+// Watches the folder or, until it exists, its nearest existing ancestor. Watching a
+// folder twice changes nothing.
 Status watchNearest(int changes, const std::string& folder) {
   for (std::string at = folder, missing;;) {
     const std::uint32_t mask = IN_CREATE | IN_MOVED_TO | (missing.empty() ? IN_MODIFY : 0);

@@ -30,7 +30,7 @@ Status RecordReader::read(bool isComplete, const LineHandler& handler) {
     offset_ = 0;
     lines_ = tornLines_ = 0;
   }
-  std::string rest;  // the beginning of a line
+  std::string rest;  // the beginning of an unfinished line
   for (;;) {
     const std::size_t kept = rest.size();
     if (kept > limits::kStructuredRecordFileBytes) {
@@ -46,7 +46,7 @@ Status RecordReader::read(bool isComplete, const LineHandler& handler) {
     if (got == 0) break;
 
     std::size_t begin = 0;
-    std::size_t searched = kept;  // the kept text has no line end
+    std::size_t searched = kept;  // the kept text contains no line end
     for (std::size_t end; (end = rest.find('\n', searched)) != std::string::npos;) {
       const std::string_view line = std::string_view(rest).substr(begin, end - begin);
       if (!line.empty() && line.find_first_not_of('\0') == std::string_view::npos) {
@@ -92,7 +92,7 @@ Expected<StructuredRecord> parseRecord(std::string_view line) {
 
 std::string recordText(const plist::Dictionary& record) {
   std::string text;
-  std::string list;  // the name of the list that is open
+  std::string list;  // the name of the open list
   std::size_t next = 0;
   const auto closeList = [&] {
     if (!list.empty()) text += ']';

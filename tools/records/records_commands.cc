@@ -99,13 +99,13 @@ void list(ToolContext& context, const Selection& selection) {
   }
 }
 
-/// Prints the records of a selection, those of one day in the order of their times.
+/// Prints the records of a selection, each day's in the order of their times.
 class RecordsView {
  public:
   RecordsView(ToolContext& context, const Selection& selection, bool follows)
       : context_(context), selection_(selection), follows_(follows) {}
 
-  /// Prints what has come since the last call.
+  /// Prints what has arrived since the last call.
   void look() {
     const auto files = recordFiles(context_, selection_);
     if (!files) return tellOnce(files.error().message);
@@ -160,7 +160,7 @@ class RecordsView {
     if (const Status whole = reader->second.wholeness(); !whole) tellOnce(whole.error().message);
   }
 
-  // JSON exactly as it was filed, so that no digit of a number is lost.
+  // Prints JSON exactly as it was filed, so that no digit of a number is lost.
   void print(std::vector<Row>& rows) {
     std::stable_sort(rows.begin(), rows.end(),
                      [](const Row& a, const Row& b) { return a.time < b.time; });

@@ -8,7 +8,7 @@
 namespace tavrel {
 namespace {
 
-/// Files events under the step during which they happen.
+/// Assigns events to the step during which they happen.
 class StepRecorder {
  public:
   void begin(std::string_view step) { current_ = step; }

@@ -21,7 +21,7 @@ namespace {
 
 using Kind = OverlayEvent::Kind;
 
-/// The most events of one kind in a row that are shown.
+/// How many consecutive events of one kind are shown.
 constexpr std::size_t kShownInARow = 8;
 
 enum class Shows : std::uint8_t { Nothing, Text, Value, Bytes, Rows };
@@ -30,10 +30,10 @@ struct Phrase {
   const char* name;  // in JSON
   const char* text;
   Shows shows;
-  const char* counted = nullptr;  // of changes, in the summary
+  const char* counted = nullptr;  // for changes, in the summary
 };
 
-// One row per kind, in the order of the kinds.
+// One row per kind, in the same order as the kinds.
 constexpr Phrase kPhrases[] = {
     {"read_preference", "reads preference", Shows::Value},
     {"read_file", "reads file", Shows::Bytes},
@@ -113,7 +113,7 @@ struct StepLine {
   std::uint64_t times = 1;
 };
 
-// Repeated reads appear once, at their first place. Records are only counted.
+// Repeated reads appear once, where the first occurred. Records are only counted.
 std::vector<StepLine> linesOf(const RehearsedStep& step, bool verbose) {
   std::vector<StepLine> lines;
   std::map<std::string, std::size_t> reads;  // the position of a line
@@ -196,7 +196,7 @@ std::string summaryOf(const Totals& totals) {
   return text.empty() ? "nothing" : text;
 }
 
-/// Reports errors of the system that the run would also have met.
+/// Reports errors of the system that a real run would also have met.
 void failOnErrors(ToolContext& context, const Rehearsal& rehearsal) {
   std::uint64_t errors = 0;
   std::string first;

@@ -29,7 +29,7 @@ plist::Dictionary recordLive(ToolContext& context, std::uint32_t seconds) {
     for (const plist::Dictionary& channel : channelsIn(samples)) {
       plist::Array& groups =
           sequences[{IOReportChannelGetDriverID(channel), IOReportChannelGetChannelID(channel)}];
-      // Nothing stands for the samples in which the channel was absent.
+      // Empty data stands for the samples in which the channel was absent.
       while (groups.size() < second)
         groups.append(plist::Data(ByteSpan()));
       groups.append(channel.data(kRawElementsKey));

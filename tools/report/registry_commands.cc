@@ -35,7 +35,7 @@ struct Arguments {
   std::uint32_t seconds = 0;
 };
 
-// The readable recordings. When some are missing, notes have said why, and the exit status is 1.
+// The readable recordings. If some are missing, notes have said why, and the exit status is 1.
 struct CurrentRecording {
   plist::Dictionary content;
   bool isWhole;
@@ -47,7 +47,7 @@ CurrentRecording currentRecording(ToolContext& context) {
   return {content, !context.hasComplaints()};
 }
 
-// The same with the live services, and the hub that is there for them.
+// Adds the live services, and the hub that exists for them.
 plist::Dictionary allServices(ToolContext& context) {
   const plist::Dictionary recorded = currentRecording(context).content;
   const plist::Array live = context.linuxPlatform().registry().liveServices();
@@ -61,7 +61,7 @@ plist::Dictionary allServices(ToolContext& context) {
   return all;
 }
 
-// The services of a recording, the hub last.
+// The services of a recording, with the hub last.
 std::vector<plist::Dictionary> servicesOf(const plist::Dictionary& recording) {
   std::vector<plist::Dictionary> services;
   for (const plist::Value& service : recording.array("Services")) {

@@ -51,7 +51,7 @@ void list(ToolContext& context, const Arguments& arguments) {
 void printOne(ToolContext& context, const Arguments& arguments, const plist::Dictionary& samples,
               std::uint32_t number, std::int32_t missing) {
   if (context.json()) {
-    // Each of several samples is one line, so that readers can see where one ends.
+    // When there are several samples, each is one line, so that readers can see where one ends.
     JsonList list(
         context.out(), {{"sample", number}, {"delta", arguments.delta}, {"missing", missing}},
         "channels", arguments.count == 1 ? JsonList::Layout::Document : JsonList::Layout::Line);
@@ -68,8 +68,8 @@ void printOne(ToolContext& context, const Arguments& arguments, const plist::Dic
   context.out().flush();
 }
 
-// Deltas, without the channels that have none. When the number of those changes, a note names the
-// first.
+// Computes deltas, leaving out channels that have none. When the number of those changes, a
+// note names the first one.
 class Changes {
  public:
   explicit Changes(ToolContext& context) : context_(context) {}
@@ -115,11 +115,11 @@ void sample(ToolContext& context, const Arguments& arguments) {
   }
 }
 
-// The system's own words. Some of them have no line end.
+// Prints the system's own text, which does not always end with a line end.
 void print(ToolContext& context, const std::optional<std::string>& description) {
   if (!description) return;
-  // Names come from drivers, so terminal control characters are escaped, except for the lines' own
-  // ends.
+  // Names come from drivers, so terminal control characters are escaped, but not
+  // the text's own line ends.
   std::string_view rest = *description;
   while (!rest.empty()) {
     const std::size_t end = std::min(rest.find('\n'), rest.size());
@@ -147,7 +147,7 @@ void describe(ToolContext& context, const Arguments& arguments) {
   }
 }
 
-// What is wrong with the text of an option; nothing when it is good.
+// What is wrong with an option's text; empty when nothing is.
 
 std::string secondsFault(const std::string& text) {
   const auto seconds = parseNumber<double>(text);

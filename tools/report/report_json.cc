@@ -23,12 +23,12 @@ void wordOrNull(JsonWriter& json, std::int64_t word) {
   if (word == kInvalidValue) return json.null();
   json.integer(static_cast<std::uint64_t>(word));
 }
-// Counts are unsigned, but their differences are not.
+// Counts are unsigned, but their differences may be negative.
 void countOrNull(JsonWriter& json, std::int64_t count, bool isDelta) {
   if (isDelta) return valueOrNull(json, count);
   wordOrNull(json, count);
 }
-// In an array of bounds every word is a bound.
+// Every word is a valid bound when the array has bounds.
 void boundOrNull(JsonWriter& json, std::int64_t bound, bool hasBounds) {
   if (hasBounds) return json.integer(static_cast<std::uint64_t>(bound));
   json.null();
@@ -75,7 +75,7 @@ void writeStates(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
     countOrNull(json.member("in_transitions"), elements.value(i, kStateInTransitions), isDelta);
     const std::int64_t residency = elements.value(i, kStateResidency);
     countOrNull(json.member("residency"), residency, isDelta);
-    // A negative count counts nothing.
+    // A negative count has no meaningful conversion.
     writeConverted(json.member("converted"), channel, residency < 0 ? kInvalidValue : residency);
     json.member("duty_cycle").real(duty);
     json.member("current").boolean(state == current);
@@ -131,7 +131,7 @@ void writeSample(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
   const std::uint8_t form = IOReportChannelGetFormat(channel);
   const Elements elements = getRawElements(channel, form);
   json.member("timestamp");
-  // The delta of a simple channel keeps the earlier time, which says nothing about it.
+  // The delta of a simple channel keeps the earlier time, which says nothing about the delta.
   if (elements && !(isDelta && form == kFormatSimple)) {
     json.integer(elements.timestamp(0));
   } else {
@@ -150,7 +150,7 @@ void writeSample(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
   }
 }
 
-// One writer for all, so that they share its buffer.
+// All elements share one writer and so its buffer.
 template <class Write>
 void addEach(JsonList& list, const plist::Dictionary& channels, const Write& write) {
   JsonWriter json = list.elementWriter();

@@ -28,7 +28,7 @@ constexpr PlainUnit kPlainUnits[] = {
     {quantity(6), "F"},
     {quantity(7), "H"},
     {quantity(8), "Hz"},
-    {quantity(9) | std::uint64_t{0x008200} << 32, kBytes},  // 2^3 bits
+    {quantity(9) | std::uint64_t{0x008200} << 32, kBytes},  // units of 2^3 bits
     {quantity(10), "°C"},
 };
 

@@ -14,7 +14,7 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
                                              const ReportSelection& selection) {
   auto channels = selectChannels(noting.platform(), selection);
   if (noting.hasErrors()) context.setExitStatus(kExitFailure);
-  // For a driver whose channels cannot be read, the notes have only the library's words.
+  // If a driver's channels cannot be read, the notes so far contain only the library's text.
   if (channels && noting.hasPrinted()) {
     context.note(
         "these drivers are left out: 'tavrelctl registry show ID' shows what they publish");

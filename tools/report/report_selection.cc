@@ -17,7 +17,7 @@ constexpr std::uint64_t kLargestFormat = 0xFF;
 
 constexpr std::string_view kFormatNames[] = {"unknown", "simple", "state", "histogram", "array"};
 
-// The selection in terms of channels.
+// The selection, translated to properties of channels.
 struct Filter {
   std::optional<std::uint64_t> categories;
   std::optional<std::uint64_t> format;
@@ -150,7 +150,7 @@ std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate) {
 }
 
 std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error) {
-  // A failure without words of its own gets those of its code.
+  // The library gives a failure without a reason of its own the standard reason of its code.
   if (!error || error->failureReason == createCFErr(error->code, nullptr)->failureReason) {
     return std::nullopt;
   }

@@ -37,13 +37,13 @@ std::string signedText(std::int64_t value) {
   return value == kInvalidValue ? "-" : std::to_string(value);
 }
 
-// A count, unsigned unless it is a difference.
+// A count: unsigned, unless it is a difference.
 std::string countText(std::int64_t value, bool isDelta) {
   if (value == kInvalidValue || isDelta) return signedText(value);
   return std::to_string(static_cast<std::uint64_t>(value));
 }
 
-// Notices the beginning of another driver, group or subgroup.
+// The position of a channel in the tree; detects where another driver, group or subgroup begins.
 class Place {
  public:
   explicit Place(const plist::Dictionary& channel)
@@ -53,7 +53,7 @@ class Place {
   Place() = default;
   bool operator==(const Place&) const = default;
 
-  /// Calls back with depth and name of each level that is not that of `earlier`.
+  /// Calls `callback` with the depth and name of each level that differs from `earlier`.
   template <class Callback>
   void forNew(const Place& earlier, const Callback& callback) const {
     bool isNew = false;
@@ -62,7 +62,7 @@ class Place {
       if (isNew && !names_[depth].empty()) callback(depth, names_[depth]);
     }
   }
-  /// How many levels the channel lies below.
+  /// How many levels are above the channel.
   std::size_t depth() const {
     if (names_[1].empty()) return 1;
     return names_[2].empty() ? 2 : 3;
@@ -82,7 +82,7 @@ std::vector<Table::Cell> cellsOf(const plist::Dictionary& channel) {
           format("%#llx", IOReportChannelGetChannelID(channel))};
 }
 
-// Prints samples: simple channels in a table for each group, others in blocks of their own.
+// Prints samples: simple channels as one table per group, the others as blocks of their own.
 class SamplePrinter {
  public:
   SamplePrinter(const Page& page, bool isDelta) : page_(page), isDelta_(isDelta) {}
@@ -176,7 +176,7 @@ class SamplePrinter {
                std::move(rows));
   }
 
-  // When one bucket has no bounds, the ones after it have none either.
+  // When one bucket has no bounds, neither do the ones after it.
   static std::string boundsText(const plist::Dictionary& channel, std::int32_t bucket,
                                 bool& hasBounds) {
     std::int64_t lower = 0;

@@ -57,7 +57,7 @@ Command Command::addChoice(const char* heading) const {
 template <class Target>
 Option Command::addOption(const char* names, Target& target, const char* description) const {
   CLI::Option* const option = app_->add_option(names, target, description);
-  // One value for each time that the option is given; what follows are arguments.
+  // Each use of the option takes one value; whatever follows is an argument.
   if (names[0] == '-') option->allow_extra_args(false);
   return Option(*option);
 }

@@ -7,7 +7,7 @@
 namespace tavrel {
 namespace {
 
-// What is wrong with a command line, and which subcommand's help to read.
+// Describes what is wrong with a command line, and names the subcommand whose help to read.
 std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   const CLI::App* command = &app;
   std::string line = app.get_name();

@@ -15,7 +15,7 @@ std::vector<std::string> namesOf(const CLI::Option& option) {
   return names;
 }
 
-// "TEXT:{a,b}" for a value that is one of few, otherwise a name.
+// CLI11's "TEXT:{a,b}" for a value that is one of a few; otherwise a plain name.
 void readType(const std::string& type, OptionModel& model) {
   const std::size_t brace = type.find(":{");
   if (brace == std::string::npos || !type.ends_with('}')) {
@@ -53,7 +53,7 @@ void addOptions(const CLI::App& app, CommandModel& model) {
   }
 }
 
-// Of the options of a choice each excludes all others.
+// Each option of a choice excludes all the others.
 void addChoice(const CLI::App& choice, CommandModel& model) {
   const std::size_t first = model.options.size();
   addOptions(choice, model);
@@ -80,7 +80,7 @@ CommandModel modelOf(const CLI::App& app, const std::string& parents) {
   return model;
 }
 
-// The program's own name is not part of the paths.
+// Removes the program's own name from the paths.
 void dropProgram(CommandModel& model, std::size_t size) {
   model.path.erase(0, std::min(size, model.path.size()));
   for (CommandModel& below : model.commands)

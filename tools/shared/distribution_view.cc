@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// The ends of a bucket, from a label such as "(-inf, 10]". Labels that are no such text go last.
+// The ends of a bucket, from a label such as "(-inf, 10]". Any other label is sorted last.
 std::pair<double, double> endsOf(std::string_view label) {
   constexpr double kLast = std::numeric_limits<double>::infinity();
   const auto read = [](std::string_view text) {

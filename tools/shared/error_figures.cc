@@ -8,7 +8,7 @@ namespace {
 
 constexpr std::string_view kNandPrefix = "com.norvane.NANDInfo.";
 
-// The prefixes of the keys.
+// Prefixes of keys.
 constexpr std::string_view kErrorFigures[] = {
     "FailedReconstruction",
     "raidFailed",

@@ -34,7 +34,7 @@ Expected<std::string> readStream(std::istream& in, std::string_view name, std::s
   return bytes;
 }
 
-// Both encodings of property lists begin with other characters.
+// A property list in either encoding begins with other characters.
 bool looksLikeJson(std::string_view bytes) {
   const std::size_t first = bytes.find_first_not_of(" \t\r\n");
   return first != std::string_view::npos &&
@@ -51,7 +51,7 @@ Expected<std::string> readInput(ToolContext& context, const std::string& file,
     return Error{
         format("cannot read %s: it is a folder: give a file, or - for standard input", file)};
   }
-  // A pipe is what a shell makes of <(command).
+  // A shell turns <(command) into a pipe.
   if (status && !S_ISREG(status->st_mode)) {
     std::ifstream in(file, std::ios::binary);
     if (!in) return systemError("read", file);
@@ -66,7 +66,7 @@ Expected<std::string> readInput(ToolContext& context, const std::string& file,
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name) {
   auto value = looksLikeJson(bytes) ? parseJsonValue(bytes) : plist::read(asBytes(bytes));
   if (!value) {
-    // The decoder does not know that JSON is also accepted.
+    // The decoder's message does not mention that JSON is also accepted.
     constexpr std::string_view kNotOne = "not a property list";
     std::string_view reason = value.error().message;
     if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};

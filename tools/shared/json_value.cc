@@ -25,8 +25,8 @@ Json special(std::string_view member, std::string text) {
   return {{std::string(member), std::move(text)}};
 }
 
-// Members go to the end of the object's list: a search for an earlier one of the same name would
-// make large dictionaries quadratic, and dictionaries have no duplicates.
+// Appends a member to the object. Searching for an earlier one of the same name would take
+// quadratic time for large dictionaries, which have no duplicates anyway.
 void appendMember(Json& object, std::string key, Json value) {
   object.get_ref<Json::object_t&>().emplace_back(std::move(key), std::move(value));
 }
@@ -71,8 +71,8 @@ bool isSpecial(std::string_view key) {
   return key == kDataMember || key == kDateMember || key == kRealMember;
 }
 
-// Builds values directly from the parser's events, so that numbers keep every digit and a deep
-// document is refused before anything recurses over it.
+// Builds values directly from the parser's events, so that numbers keep every digit and a document
+// that nests too deeply is refused before anything recurses over it.
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
   plist::Value takeResult() { return std::move(result_); }
@@ -123,7 +123,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   }
 
   bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception& e) override {
-    // The parser's own text begins with a tag in brackets.
+    // The parser's message begins with a tag in brackets.
     const std::string_view text = e.what();
     const std::size_t tag = text.find("] ");
     message_ = text.substr(tag == std::string_view::npos ? 0 : tag + 2);

@@ -16,13 +16,13 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
     return Done{};
   }
   if (file.empty()) return Error{"--output is empty: name a file, or - for standard output"};
-  // Replacing a device or a pipe by a file is never intended.
+  // Nobody intends to replace a device or a pipe with a file.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
     return Error{format("cannot write %s: it is not a regular file: use -o - and redirect", file)};
   }
   const auto path = std::filesystem::absolute(file);
-  // Missing folders are a typing error here; do not make them.
+  // A missing folder is probably a typing error, so do not make it.
   const auto folder = path.parent_path().string();
   if (!FileSystem::status(folder)) {
     const char* const reason = std::strerror(errno);

@@ -14,10 +14,10 @@ namespace {
 constexpr std::string_view kGap = "  ";
 constexpr std::size_t kNarrowestColumn = 8;
 
-// Otherwise one long key would push all rows of a listing in a pipe far to the right.
+// Without this limit, one long key would push all rows of a listing in a pipe far to the right.
 constexpr std::size_t kWidestPadding = 48;
 
-// Control characters, separators of lines and paragraphs, and what changes the direction of text.
+// Control characters, line and paragraph separators, and characters that change the text direction.
 bool actsOnTerminal(char32_t codePoint) {
   return codePoint < 0x20 || (codePoint >= 0x7F && codePoint < 0xA0) || codePoint == 0x2028 ||
          codePoint == 0x2029 || changesDirection(codePoint);
@@ -34,7 +34,7 @@ void appendEscape(std::string& out, std::string_view bytes) {
   }
 }
 
-// The beginning of `text` that takes `width` columns.
+// The beginning of `text` that fits in `width` columns.
 std::string_view firstColumns(std::string_view text, std::size_t width) {
   std::string_view rest = text;
   while (width > 0 && !rest.empty()) {
@@ -122,7 +122,7 @@ std::vector<std::size_t> Table::widths(const Page& page) const {
   const std::size_t taken =
       std::accumulate(widths.begin(), widths.end(), indent_ + kGap.size() * (columns_.size() - 1));
 
-  std::optional<std::size_t> widest;  // of those that can be cut
+  std::optional<std::size_t> widest;  // of the columns that can be cut
   for (std::size_t i = 0; i < columns_.size(); ++i) {
     if (columns_[i].align == Align::Bar) {
       const std::size_t room = page.barColumns() > taken ? page.barColumns() - taken : 0;
@@ -143,7 +143,7 @@ std::vector<std::size_t> Table::widths(const Page& page) const {
 void Table::printRow(const Page& page, const std::vector<Cell>& row,
                      const std::vector<std::size_t>& widths) const {
   std::string line(indent_, ' ');
-  std::size_t blanks = 0;  // to print before what follows
+  std::size_t blanks = 0;  // pending blanks before the next text
   for (std::size_t i = 0; i < columns_.size(); ++i) {
     if (i > 0) blanks += kGap.size();
     std::string shown = row[i].text;

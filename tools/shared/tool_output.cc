@@ -13,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-// Of syslog.
+// syslog priorities
 constexpr char kErrorPriority = '3';
 constexpr char kWarningPriority = '4';
 
@@ -25,7 +25,7 @@ std::optional<std::size_t> terminalColumns() {
   return size.ws_col;
 }
 
-// NO_COLOR as no-color.org describes it.
+// Follows NO_COLOR as no-color.org describes it.
 bool isColoured() {
   if (!isatty(STDOUT_FILENO)) return false;
   const char* const refusal = std::getenv("NO_COLOR");

@@ -27,10 +27,10 @@ using Ticks = CollectPace::Ticks;
 
 constexpr std::size_t kReadingsPerTransaction = 60;
 
-// Of the number of processes only the latest is kept: readings of each second leave it out.
+// Only the latest number of processes is kept, so most readings leave it out.
 constexpr std::uint64_t kSecondsPerCount = 60;
 
-// Reads the machine, and computes values from each reading and the one before.
+// Reads the machine, and computes values from each reading and the previous one.
 class Collector {
  public:
   Collector(ToolContext& context, ValueRecorder& recorder, std::uint64_t readingsPerCount)
@@ -68,11 +68,11 @@ class Collector {
     return recorder_.keep();
   }
 
-  /// The last reading; there must be one.
+  /// The last reading; there must have been one.
   const CollectState& state() const { return *last_; }
   std::uint64_t count() const { return count_; }
 
-  /// Statistics that no reading has given so far, with a blank before each.
+  /// Statistics that no reading has provided so far, each preceded by a blank.
   std::string missing() const {
     std::string keys;
     for (const MachineStatistic& statistic : machineStatistics()) {
@@ -88,7 +88,7 @@ class Collector {
     double value;
   };
 
-  // The value as it is kept: of a sum the whole part; the rest stays for the next time.
+  // The value to keep: of a sum, the whole part; the next reading gets the rest.
   static double kept(const MachineStatistic& statistic, double value, CollectState& now) {
     if (statistic.keeping != Keeping::Sum) return value;
     double& remainder = now.remainders[statistic.key];
@@ -121,7 +121,7 @@ class Collector {
   std::set<std::string_view> told_;
 };
 
-// Holds SIGINT and SIGTERM back while it lives, so that what was sampled is kept when they come.
+// Blocks SIGINT and SIGTERM during its lifetime, so that sampled values are kept when they arrive.
 class EndSignals final : public CollectPace {
  public:
   EndSignals() {
@@ -131,7 +131,7 @@ class EndSignals final : public CollectPace {
     pthread_sigmask(SIG_BLOCK, &signals_, &before_);
   }
   ~EndSignals() override {
-    // One that came meanwhile asked for the end that this is.
+    // Discard signals that arrived since: they asked for the end that this is.
     while (waitForOne(Ticks())) {
     }
     pthread_sigmask(SIG_SETMASK, &before_, nullptr);
@@ -174,7 +174,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
       collector.read(pace.now().time_since_epoch());
       progress.show(format("collecting: %u of %u seconds", second, seconds));
       const bool isLast = second == seconds;
-      // Before the wait: a reading counts for the day on which it is made.
+      // Keep the values before the wait: a reading counts for the day on which it is made.
       if (isLast || collector.isFull()) kept = collector.keep();
       if (isLast || !kept) break;
       endsEarly = pace.endsBefore(start + std::chrono::seconds(second + 1));
@@ -187,7 +187,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
   context.out() << "kept " << counted(collector.count(), "sample")
                 << " of this machine, taken over " << counted(second, "second") << '\n';
   if (endsEarly) context.note(format("ended by a signal before %u seconds were over", seconds));
-  // One reading alone gives no rates, which needs no message.
+  // A single reading gives no rates, which needs no message.
   if (const std::string keys = collector.missing(); collector.count() > 1 && !keys.empty()) {
     context.note("not recorded, no reading available:" + keys);
   }
@@ -200,8 +200,8 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
 
 namespace {
 
-// Takes single readings, each of which goes on from the one that a file has from the reading
-// before.
+// Takes single readings; each continues from the previous reading, which
+// a file holds between runs.
 class SingleReadings {
  public:
   SingleReadings(ToolContext& context, ValueRecorder& recorder, const std::string& stateFile)
@@ -219,8 +219,8 @@ class SingleReadings {
       collector_.startFrom(std::move(*before));
     }
     collector_.read(now);
-    // The state comes first: when the run is killed before it has kept the values, those are lost.
-    // The other way the next reading would count them again.
+    // Write the state first: a kill before the values are kept then loses them. In the other order,
+    // the next reading would count them twice.
     if (Status done = writeCollectState(path_, boot_, collector_.state()); !done) return done;
     return collector_.keep();
   }

@@ -15,10 +15,10 @@
 namespace tavrel {
 namespace {
 
-// Bytes of a file in /proc or /sys. Those of machines with hundreds of CPUs have some 100 KiB.
+// Bytes of a file in /proc or /sys; with hundreds of CPUs, some have about 100 KiB.
 constexpr std::size_t kLargestFile = 1U << 20;
 
-// Replaces `content`; empty when the file cannot be read.
+// Rereads the file into `content`, which stays empty when that fails.
 void readAgain(const Descriptor& file, std::string& content) {
   constexpr std::size_t kPart = 4096;
   std::size_t size = 0;
@@ -37,7 +37,7 @@ std::string contentOf(const std::string& path) {
   return content;
 }
 
-// Hands the names in a folder to `take`.
+// Calls `take` for each name in a folder.
 template <class Take>
 void eachName(const std::string& folder, Take take) {
   const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), closedir);
@@ -46,7 +46,7 @@ void eachName(const std::string& folder, Take take) {
     take(std::string_view(entry->d_name));
 }
 
-// Block devices of the kernel's own, which have no device behind them; there may be many.
+// Block devices that the kernel provides without hardware; there may be many.
 bool isVirtualDisk(std::string_view name) {
   return name.starts_with("loop") || name.starts_with("ram") || name.starts_with("zram");
 }
@@ -57,7 +57,7 @@ std::string_view takeLine(std::string_view& text) {
   return line;
 }
 
-// The first fields of a line, as many as are used.
+// The first fields of a line; only as many as are used.
 class Fields {
  public:
   explicit Fields(std::string_view line) {
@@ -94,7 +94,7 @@ std::optional<Number> firstNumber(std::string_view text) {
   return fields.empty() ? std::nullopt : numberOf<Number>(fields[0]);
 }
 
-// Thermal zones give thousandths of a degree.
+// Thermal zones report thousandths of a degree.
 std::optional<double> readTemperature(const DeviceRoot& root) {
   std::optional<double> hottest;
   const std::string folder = root.pathOrMachine("/sys/class/thermal");
@@ -119,7 +119,7 @@ std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
 }
 
 void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
-  // The folder may not exist yet; it will then be on the file system of the one above.
+  // If the folder does not exist yet, it will be on its parent's file system.
   std::filesystem::path folder = root.path("/var/mobile");
   struct statvfs status;
   while (statvfs(folder.c_str(), &status) != 0) {
@@ -154,8 +154,8 @@ bool MachineSources::isDisk(std::string_view name) {
   return is;
 }
 
-// "cpu  user nice system idle iowait irq softirq steal ...", then a line for each CPU. Guest time
-// is part of user time.
+// "cpu  user nice system idle iowait irq softirq steal ...", followed by a line for each CPU. User
+// time includes guest time.
 void MachineSources::readCpu(MachineReading& reading) {
   constexpr std::size_t kIdle = 4;
   constexpr std::size_t kWaiting = 5;

@@ -8,7 +8,7 @@
 //   disk IN OUT
 //   remainder KEY NUMBER
 //
-// A counter that the machine does not tell has no line. The last line is "end".
+// A counter that the machine does not provide has no line. The last line is "end".
 #include "tools/stat/collect_state.h"
 
 #include <algorithm>

@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-// Everything but the key: kind, day, numbers and tabs.
+// Room for everything besides the key: kind, day, numbers and tabs.
 constexpr std::size_t kLongestLine = limits::kStoreKeyBytes + 4096;
 
 // A long text would bury the rest of the message.
@@ -22,7 +22,7 @@ std::string_view shortened(std::string_view text) {
   return text.substr(0, 60);
 }
 
-// Cuts the text before the next tab off the front. False when there is no tab.
+// Takes the text before the next tab off the front. False when there is no tab.
 bool takeField(std::string_view& rest, std::string_view& field) {
   const std::size_t tab = rest.find('\t');
   if (tab == std::string_view::npos) return false;

@@ -20,8 +20,8 @@ constexpr std::uint64_t kQuietNan = 0x7FF8000000000000;
 constexpr std::uint64_t kInfinity = 0x7FF0000000000000;
 constexpr std::uint64_t kQuietPayload = (std::uint64_t{1} << 51) - 1;
 
-// The not-a-number that "nan" or "nan(BITS)" after the sign stands for; nothing for another text.
-// Bits that are not a number count as none, as for strtod.
+// The not-a-number for "nan" or "nan(BITS)", with or without a sign; nothing for any other text.
+// Bits that are not a number are ignored, as strtod does.
 std::optional<double> parseNan(std::string_view text) {
   const bool negative = text.starts_with('-');
   if (negative || text.starts_with('+')) text.remove_prefix(1);
@@ -51,7 +51,7 @@ Expected<double> parseExactDouble(std::string_view text) {
   const auto plain = parseNumber<double>(text);
   if (plain && !std::isnan(*plain)) return *plain;
 
-  // Forms that are rare enough to be copied.
+  // Rare forms, for which a copy does not matter.
   constexpr std::string_view kBlanks = " \t\n\v\f\r";
   const std::size_t first = text.find_first_not_of(kBlanks);
   if (first == std::string_view::npos) return Error{"a number is missing"};

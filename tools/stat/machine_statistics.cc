@@ -9,8 +9,8 @@ std::optional<double> real(const std::optional<Number>& number, double divisor =
   return static_cast<double>(*number) / divisor;
 }
 
-// The growth of a counter. A counter that has gone back was restarted or lost a device, and its
-// growth is unknown.
+// The growth of a counter. When a counter has gone back, it was restarted or lost a device,
+// and its growth is unknown.
 std::optional<double> growth(std::uint64_t now, std::uint64_t before) {
   if (now < before) return std::nullopt;
   return static_cast<double>(now - before);

@@ -17,7 +17,7 @@ struct Arguments {
   std::vector<std::string> values;
 };
 
-// Hands a recorder and the time to `give`, and reports what went wrong.
+// Calls `give` with a recorder and the time, and reports failures.
 template <class Give>
 void keep(ToolContext& context, Give give) {
   const auto recorder = openRecorder(context);
@@ -27,7 +27,7 @@ void keep(ToolContext& context, Give give) {
   if (!done) context.fail(done.error().message);
 }
 
-// False after a message.
+// False, after a message, when the key is invalid.
 bool checkKey(ToolContext& context, const std::string& key) {
   const std::string fault = keyFault(key);
   if (!fault.empty()) context.failUsage(fault);

@@ -28,7 +28,7 @@ struct Arguments {
   std::optional<std::uint32_t> days;
 };
 
-// A day from the command line. False, after a message, when it is not one.
+// Parses a day from the command line. False, after a message, when it is not one.
 bool parseDayOption(ToolContext& context, const std::string& text,
                     std::optional<std::int32_t>& day) {
   if (text.empty()) return true;
@@ -53,7 +53,7 @@ bool isPositiveNumber(const std::string& text) {
   return parseNumber<std::uint32_t>(text).value_or(0) > 0;
 }
 
-// What is wrong with the text of --days and --every; nothing when it is good.
+// What is wrong with the text of --days or --every; empty when nothing is.
 std::string daysFault(const std::string& text) {
   if (isPositiveNumber(text)) return {};
   return format("not a number of days: %s: give 1 or more", text);

@@ -15,14 +15,14 @@
 namespace tavrel {
 namespace {
 
-// Rows that are held back to measure their columns. In a longer list the widths fit any row.
+// Rows that are held back to measure columns. The widths of a longer list fit any row.
 constexpr std::size_t kRowsMeasured = 1024;
 constexpr std::size_t kBytesMeasured = 256U << 10;
 
 constexpr std::string_view kNumbers = "-9223372036854775808";
 constexpr std::string_view kDistribution = "distribution";
 
-// One statistic of one day: the value of a scalar, or how many values a distribution has.
+// One statistic on one day: the value of a scalar, or the number of values of a distribution.
 struct Row {
   bool isScalar;
   std::int32_t day;
@@ -30,7 +30,7 @@ struct Row {
   std::string_view key;
 };
 
-// The date of a day; the rows of one day follow each other.
+// Caches the date of a day, because the rows of one day follow each other.
 class DayTexts {
  public:
   const std::string& date(std::int32_t day) {
@@ -58,7 +58,7 @@ void appendNumber(std::string& out, std::int64_t number) {
   out.append(digits, end);
 }
 
-// The table. The key is the last column, so that a long one shifts no other.
+// Writes the table. The key is the last column, so that a long one does not shift others.
 class TableWriter {
  public:
   TableWriter(LineWriter& lines, std::optional<std::size_t> columns, std::size_t widestDay)
@@ -172,13 +172,13 @@ class TableWriter {
   DayTexts days_;
   Widths widths_;
   bool isMeasured_ = false;
-  std::vector<Row> rows_;  // until they are measured; `keys_` has their keys
+  std::vector<Row> rows_;  // held until measured; `keys_` has their keys
   std::vector<std::size_t> keySizes_;
   std::string keys_;
   std::string value_;
 };
 
-// Passes each row to `add`, scalars first, and calls `between` after the scalars.
+// Passes each row to `add`, scalars first, and calls `between` after the last scalar.
 template <class Add, class Between>
 Status walk(RecordedHistory& history, LineWriter& lines, Add add, Between between) {
   bool goesOn = true;
@@ -208,7 +208,7 @@ Status printTable(ToolContext& context, RecordedHistory& history) {
   TableWriter table(lines, context.columns(), widestDay);
   const Status walked = walk(
       history, lines, [&](const Row& row) { table.add(row); }, [] {});
-  // A line has said what could not be read.
+  // When something could not be read, a message has already said so.
   const bool isWhole = walked && context.exitStatus() == kExitSuccess;
   if (!table.finish() && isWhole) lines.buffer() += "no statistics\n";
   return walked;

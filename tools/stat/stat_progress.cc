@@ -4,7 +4,7 @@
 
 namespace tavrel {
 
-// "Carriage return, erase to the end of the line".
+// Carriage return, then "erase to the end of the line".
 constexpr std::string_view kLineStart = "\r\x1b[K";
 
 StatProgress::~StatProgress() {

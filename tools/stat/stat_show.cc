@@ -32,7 +32,7 @@ struct DistributionDay {
   Summary summary;
 };
 
-// What is shown of a key, which may be a scalar and a distribution at once.
+// The data of a key, which may be both a scalar and a distribution.
 struct Statistic {
   std::string key;
   std::vector<ScalarDay> scalarDays;
@@ -85,7 +85,7 @@ Expected<Statistic> readStatistic(RecordedHistory& history, const std::string& k
   return statistic;
 }
 
-// "Scalar com.norvane.usage.swap.used_mib, 2 days", and what it means where the catalogue says so.
+// "Scalar com.norvane.usage.swap.used_mib, 2 days", plus its meaning if the catalogue has it.
 void printTitle(ToolContext& context, const char* kind, const std::string& key, std::size_t days) {
   context.out() << kind << ' ' << printable(key) << ", " << counted(days, "day") << '\n';
   const catalogue::Entry* const entry = catalogue::findStatistic(key);

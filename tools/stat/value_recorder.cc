@@ -43,7 +43,7 @@ class MemoryRecorder final : public ValueRecorder {
     return Done{};
   }
   Status keep() override {
-    // A fold looks for files in the folder that has the name now.
+    // A fold looks in the folder that has this name now, so it must still be the same one.
     const auto now = FileSystem::status(folder_);
     if (!now || !identity_ || now->st_dev != identity_->st_dev ||
         now->st_ino != identity_->st_ino) {
@@ -58,7 +58,7 @@ class MemoryRecorder final : public ValueRecorder {
   bool isInMemory() const override { return true; }
 
  private:
-  // A fold would refuse the value when nobody sees it.
+  // Otherwise a fold would refuse the value later, when nobody is watching.
   Status checkRights(std::string_view key) const {
     if (user_ == 0 || recorders_.mayRecord(user_, key)) return Done{};
     return Error{
@@ -110,7 +110,7 @@ class StoreRecorder final : public ValueRecorder {
   std::unique_ptr<SqliteBatch> batch_;
 };
 
-// The device's own are read only where they matter: root may record all.
+// The device's recorders, read only when they matter: root may record every key.
 Recorders recordersOf(ToolContext& context) {
   const bool isNeeded =
       geteuid() != 0 && FileSystem::status(context.root().path("/etc/tavrel/recorders.plist"));
@@ -126,7 +126,7 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
   const std::string root = context.root().path("");
   const std::string folder = context.root().path("/run/tavrel/stat");
   setenv("TAVREL_ROOT", root.c_str(), 1);
-  // The library begins to record once a key was looked up. A key without values leaves nothing.
+  // The library starts with the first lookup of a key. A key without values leaves no trace.
   BHClientScalarForKey("any");
   switch (BHClientGetStatus(nullptr)) {
     case BHClientStatusNoFolder:

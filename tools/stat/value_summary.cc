@@ -14,7 +14,7 @@ constexpr std::size_t kDigits = std::size_t{1} << kBitsPerPass;
 constexpr std::uint64_t kSign = std::uint64_t{1} << 63;
 constexpr double kMostBuckets = 11;
 
-// Maps values to bits of the same order, and back.
+// Maps values to bits that sort in the same order, and back.
 std::uint64_t orderedBits(double value) {
   const auto bits = std::bit_cast<std::uint64_t>(value);
   return bits & kSign ? ~bits : bits | kSign;
@@ -23,7 +23,7 @@ double valueOf(std::uint64_t ordered) {
   return std::bit_cast<double>(ordered & kSign ? ordered & ~kSign : ~ordered);
 }
 
-// The smallest number not below `width` that is 1, 2 or 5 times a power of ten.
+// The smallest number of at least `width` that is 1, 2 or 5 times a power of ten.
 double roundedUp(double width) {
   const double power = std::pow(10, std::floor(std::log10(width)));
   for (const double factor : {1.0, 2.0, 5.0}) {
@@ -58,7 +58,7 @@ void Summary::add(double value) {
 }
 
 double Summary::mean() const {
-  // Like the mean, the sum of the extremes is infinite or not a number.
+  // With infinities, mean_ is useless, but the sum of the extremes gives the right result.
   return finite_ == numbers_ ? mean_ : minimum_ + maximum_;
 }
 
@@ -70,7 +70,7 @@ double Summary::standardDeviation() const {
 PercentileSearch::PercentileSearch(std::int64_t numbers, std::span<const int> percents) {
   if (numbers <= 0) return;
   for (const int percent : percents) {
-    // Rounded up, without a product that could overflow.
+    // Rounds up without a product that could overflow.
     const std::int64_t place = numbers / 100 * percent + (numbers % 100 * percent + 99) / 100;
     wanted_.push_back({std::max<std::int64_t>(place, 1) - 1, 0});
   }
@@ -124,7 +124,7 @@ RoundHistogram::RoundHistogram(const Summary& summary)
     : lowest_(summary.lowest()), highest_(summary.highest()) {
   if (!summary.hasFinite()) return;
   double buckets = 1;
-  // Divides first, because the difference may exceed a double.
+  // Divides first, because the difference may exceed the range of a double.
   const double narrowest = highest_ / kMostBuckets - lowest_ / kMostBuckets;
   if (std::isnormal(narrowest)) {
     width_ = roundedUp(narrowest);

@@ -35,7 +35,7 @@ std::optional<WhitelistTable> tableNamed(std::string_view name) {
   return std::nullopt;
 }
 
-/// The findings so far; from the limit on they are only counted.
+/// The findings so far; beyond the limit they are only counted.
 class Findings {
  public:
   void add(std::string path, std::string message) {
@@ -56,7 +56,7 @@ class Findings {
   std::size_t surplus_ = 0;
 };
 
-/// Collects findings under the path of the current place.
+/// Collects findings, each with the path of its place.
 class Checker {
  public:
   explicit Checker(Findings& findings) : findings_(findings) {}
@@ -69,7 +69,7 @@ class Checker {
     }
     for (const plist::Entry& group : whitelist.dictionary()) {
       const Place place(*this, group.key);
-      // What leaves internal devices only is meant to be exact.
+      // Statistics that leave only internal devices are meant to be exact.
       isForAll_ = group.key != kInternalTestingGroup;
       checkGroup(group.value);
     }
@@ -77,7 +77,7 @@ class Checker {
 
   void add(std::string message) { findings_.add(path_, std::move(message)); }
 
-  /// Lengthens the path while it lives.
+  /// Extends the path during its lifetime.
   class Place {
    public:
     Place(Checker& checker, std::string_view name)
@@ -205,7 +205,7 @@ class Checker {
   }
 
   std::string path_;
-  bool isForAll_ = true;  // the group
+  bool isForAll_ = true;  // whether the group is for all devices
   Findings& findings_;
 };
 
@@ -221,7 +221,7 @@ void findRivals(const std::vector<WhitelistRule>& rules, Findings& findings) {
   }
 }
 
-// In sorted order a prefix directly follows those that it begins with; the stack holds them.
+// When sorted, a prefix directly follows those that it begins with; the stack holds these.
 void findHiddenPrefixes(const std::vector<WhitelistRule>& rules, Findings& findings) {
   std::vector<const WhitelistRule*> sorted;
   sorted.reserve(rules.size());
@@ -235,7 +235,7 @@ void findHiddenPrefixes(const std::vector<WhitelistRule>& rules, Findings& findi
       enclosing.pop_back();
     }
     if (!enclosing.empty() && enclosing.back()->key == rule->key) {
-      enclosing.pop_back();  // a rival in another group, which has its finding
+      enclosing.pop_back();  // a rival in another group, already found
     } else if (!enclosing.empty()) {
       findings.add(pathOfRule(*enclosing.back()),
                    format("is hidden by the longer prefix %s for keys that begin with that",

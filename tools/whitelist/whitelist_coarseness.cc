@@ -22,8 +22,8 @@ std::uint32_t widthOf(const plist::Dictionary& options) {
   return std::max<std::uint32_t>(width ? width->uint32() : 1, 1);
 }
 
-// Counts of figures are subtracted in 32 bits: those near 2^32 drop more than any value has, and
-// leave 0.
+// Counts of figures are subtracted in 32 bits: a count near 2^32 drops more figures than
+// any value has and leaves 0.
 std::int64_t figuresOf(const plist::Dictionary& options) {
   const auto figures = options.number(kSignificantFiguresOption);
   if (!figures) return kAllFigures;
@@ -32,7 +32,7 @@ std::int64_t figuresOf(const plist::Dictionary& options) {
   return std::min<std::int64_t>(figures->uint32(), kAllFigures);
 }
 
-// Boundaries at which the histogram is divided; others never decide.
+// The boundaries that divide the histogram; others have no effect.
 std::vector<double> boundariesOf(const plist::Dictionary& options) {
   std::vector<double> boundaries;
   const plist::Array intervals = options.array(kIntervalsOption);

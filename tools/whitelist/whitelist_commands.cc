@@ -25,7 +25,7 @@ namespace tavrel {
 namespace {
 
 struct Arguments {
-  std::string file;  // empty for the device's own
+  std::string file;  // empty: the device's own
   std::string files[2];
   std::vector<std::string> keys;
   std::string value;
@@ -39,7 +39,7 @@ struct Whitelist {
 
 Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file) {
   const std::string path = file.empty() ? context.root().path(kWhitelistPath) : file;
-  // The device's own must be a file, as for the daemon; another may be a pipe.
+  // The device's own must be a file, as the daemon requires; any other may be a pipe.
   auto bytes = file.empty()
                    ? context.linuxPlatform().fileSystem().read(path, limits::kWhitelistBytes)
                    : readInput(context, path, limits::kWhitelistBytes);
@@ -50,7 +50,7 @@ Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file)
   return Whitelist{name, *std::move(bytes), *std::move(value)};
 }
 
-// As below, 1 is what the command looks for, and 2 that it could not look.
+// As for `diff` below: 1 means that there are findings, 2 that it could not look.
 void check(ToolContext& context, const Arguments& arguments) {
   const auto whitelist = readWhitelist(context, arguments.file);
   if (!whitelist) return context.failUsage(whitelist.error().message);
@@ -79,7 +79,7 @@ void check(ToolContext& context, const Arguments& arguments) {
   }
 }
 
-// As diff(1): 2 when the files could not be compared.
+// Like diff(1), exits with 2 when the files could not be compared.
 void diff(ToolContext& context, const Arguments& arguments) {
   std::vector<Whitelist> both;
   for (const std::string& file : arguments.files) {

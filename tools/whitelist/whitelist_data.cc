@@ -19,18 +19,18 @@
 namespace tavrel {
 namespace {
 
-// Minimum, maximum, mean, deviation and count are as many equations as four values have unknowns.
+// Four values are four unknowns, which minimum, maximum, mean, deviation and count can determine.
 constexpr std::int64_t kKnownFromSummary = 4;
 
-// With less than two values in a bucket on average, a histogram tells most values by themselves. In
-// few buckets that is chance.
+// With less than two values per bucket on average, a histogram reveals most values individually. If
+// there are few buckets, that may be chance.
 constexpr std::int64_t kFewBuckets = 8;
 
-/// Counts what one distribution would show.
+/// Counts what the log would reveal of one distribution.
 struct Shown {
   std::int64_t values = 0;
   std::int64_t notNumbers = 0;
-  std::int64_t buckets = 0;  // that hold something; 0 without a histogram
+  std::int64_t buckets = 0;  // buckets that are not empty; 0 without a histogram
 
   Shown(BHHistoryDistributionEnumerator& enumerator, const plist::Dictionary& options) {
     const plist::Array intervals = options.array(kIntervalsOption);
@@ -85,7 +85,7 @@ class DataCheck {
   WhitelistRules rules_;
 };
 
-// The last day that is over, otherwise the last one.
+// The last day before today; when there is none, the first day on record.
 std::optional<std::int32_t> dayToCheck(const std::vector<std::int32_t>& days, std::int32_t today) {
   if (days.empty()) return std::nullopt;
   const auto next = std::ranges::lower_bound(days, today);

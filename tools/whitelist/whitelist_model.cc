@@ -4,7 +4,7 @@ namespace tavrel {
 
 namespace {
 
-// Bytes of one name in a finding's path; a file may repeat a name of a megabyte many times.
+// Bytes of a name in a finding's path: a file may repeat a name of one megabyte many times.
 constexpr std::size_t kShownNameBytes = 200;
 
 }  // namespace

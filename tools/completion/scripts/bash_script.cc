@@ -7,7 +7,7 @@ constexpr std::string_view kBegin = R"(# bash completion for @program@. Generate
 
 )";
 
-// Names from the device are compared and never expanded: whoever records chooses them.
+// Names from the device are compared but never expanded: anybody who records values chooses them.
 constexpr std::string_view kEnd = R"(
 _@id@_complete() {
   local kind=$1 value

@@ -62,7 +62,7 @@ std::string fishQuoted(std::string_view text) {
   return shellQuoted(doubled, kQuoteEscape);
 }
 
-// The option of `complete` for values, after the names.
+// The values for `complete`: what follows the names of an option.
 std::string valueText(const CompletedProgram& program, const CommandModel& command,
                       const OptionModel& option) {
   const std::string only = option.names.empty() ? "" : " -x";

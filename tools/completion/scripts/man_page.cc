@@ -10,7 +10,7 @@
 namespace tavrel {
 namespace {
 
-// Text of a page: hyphens stay hyphens, and no line becomes a request.
+// Escapes text for a page: hyphens stay hyphens, and no line becomes a request.
 std::string roff(std::string_view text) {
   std::string result;
   if (text.starts_with('.') || text.starts_with('\'')) result += "\\&";
@@ -44,7 +44,7 @@ std::string usageOf(const OptionModel& option) {
   return text;
 }
 
-// Options that exclude each other share a pair of brackets.
+// Options that exclude each other share one pair of brackets.
 std::string usageOf(const CommandModel& command) {
   std::string line = strong(command.path);
   std::set<std::string> written;
@@ -121,7 +121,7 @@ class ManPage {
     hasProse_ = false;
   }
 
-  // Those of all commands that share the prose, each once.
+  // Adds each option of the commands that share the prose, once.
   void addOptions() {
     std::set<std::string> written{"--json"};
     std::string entries;
@@ -149,8 +149,8 @@ class ManPage {
 
   std::vector<const CommandModel*> commands_;  // without groups
   std::set<std::string> named_;
-  std::vector<const CommandModel*> open_;  // whose options are still to come
-  bool hasProse_ = false;                  // since the last of them
+  std::vector<const CommandModel*> open_;  // their options are still to come
+  bool hasProse_ = false;                  // since the latest of them
   std::string text_;
 };
 

@@ -32,7 +32,7 @@ std::string functionName(const CommandModel& command) {
   return name;
 }
 
-// A text within an argument of _arguments or _describe.
+// Escapes text within an argument of _arguments or _describe.
 std::string plain(std::string_view text) {
   std::string result;
   for (const char character : text) {
@@ -59,7 +59,7 @@ std::string argumentOf(const CompletedProgram& program, const CommandModel& comm
   std::string text = "(" + joined(option.names);
   for (const std::string& other : option.excludes)
     text += ' ' + other;
-  // "=" allows --name=VALUE beside --name VALUE.
+  // "=" allows --name=VALUE as well as --name VALUE.
   const bool allowsBoth = !option.isFlag() && name.starts_with("--");
   text += ")" + name + (allowsBoth ? "=" : "") + "[" + plain(option.description) + "]";
   return shellQuoted(option.isFlag() ? text : text + valueText(program, command, option));
@@ -92,7 +92,7 @@ void addFunction(const CompletedProgram& program, const CommandModel& command,
   for (const CommandModel& below : command.commands)
     addFunction(program, below, script);
   script += functionName(command) + "() {\n";
-  // Of `words`, commands see what comes after their names.
+  // In `words`, commands see only what follows their names.
   if (command.path.empty()) script += "  local -a _@id@_line=($words)\n";
   script += "  local -a anywhere=(" +
             argumentOf(program, {}, program.anywhereOption(), program.anywhere) +
@@ -115,7 +115,7 @@ void addFunction(const CompletedProgram& program, const CommandModel& command,
 
 std::string zshScript(const CompletedProgram& program) {
   CommandModel model = program.model;
-  // Each function offers this one itself.
+  // Each function adds this option itself.
   std::erase_if(model.options,
                 [&](const OptionModel& option) { return option.name() == program.anywhere; });
   std::string script(kBegin);
