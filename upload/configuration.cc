@@ -35,7 +35,7 @@ constexpr Switch kSwitches[] = {{"AllowPlainHTTP", &Configuration::mayBePlain},
 constexpr std::string_view kUrlKey = "URL";
 constexpr std::string_view kMeteredKey = "MeteredInterfaces";
 
-// Nothing when the URL lacks the part.
+// Nothing when the URL lacks that part.
 std::optional<std::string> partOf(CURLU* url, CURLUPart part) {
   char* text = nullptr;
   if (curl_url_get(url, part, &text, 0) != CURLUE_OK) return std::nullopt;
@@ -43,7 +43,7 @@ std::optional<std::string> partOf(CURLU* url, CURLUPart part) {
   return std::string(text);
 }
 
-// An empty text when the URL is usable.
+// Returns what is wrong with the URL; empty when it is usable.
 std::string takeUrl(std::string_view text, Configuration& configuration) {
   const std::unique_ptr<CURLU, void (*)(CURLU*)> url(curl_url(), curl_url_cleanup);
   configuration.url = text;
@@ -83,7 +83,7 @@ std::string takeInterfaces(const plist::Value& value, Configuration& configurati
   return {};
 }
 
-// An empty text when the entry is one that is known, with a value of its type.
+// Returns what is wrong with the entry; empty when it is known and its value has the right type.
 std::string takeEntry(std::string_view key, const plist::Value& value,
                       Configuration& configuration) {
   constexpr std::int64_t kLongest = limits::kLongestUploadPauseSeconds;
@@ -103,11 +103,11 @@ std::string takeEntry(std::string_view key, const plist::Value& value,
     return {};
   }
   if (key == kMeteredKey) return takeInterfaces(value, configuration);
-  if (key == kUrlKey) return {};  // once it is known whether it may be plain
+  if (key == kUrlKey) return {};  // checked once it is known whether it may be plain
   return format("%s is not a setting: see tavrel-upload(8)", key.substr(0, 100));
 }
 
-// A token goes into a header as it is (RFC 6750).
+// Tokens are sent unescaped in a header (RFC 6750).
 bool isToken(std::string_view text) {
   return !text.empty() && std::all_of(text.begin(), text.end(), [](char c) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||

@@ -13,14 +13,14 @@
 namespace tavrel::upload {
 namespace {
 
-// Below this many bytes a second a transfer stalls.
+// bytes a second, below which a transfer counts as stalled
 constexpr long kSlowest = 100;
 
 template <class Argument>
 void set(CURL* handle, CURLoption option, Argument argument) {
   const CURLcode code = curl_easy_setopt(handle, option, argument);
   if (code == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
-  // Among them are the deadlines, and what keeps the connection to TLS.
+  // Deadlines and the restriction to TLS are among the options, so none may fail silently.
   if (code != CURLE_OK) {
     throw std::runtime_error(format("libcurl refuses option %d: %s", static_cast<int>(option),
                                     curl_easy_strerror(code)));
@@ -39,7 +39,7 @@ std::string headerOf(CURL* handle, const char* name) {
 
 }  // namespace
 
-// What the callbacks of one transfer share.
+// The data that the callbacks of one transfer share.
 struct Connection::Transfer {
   const GoOn& goOn;
   std::chrono::steady_clock::time_point asked;
@@ -68,7 +68,7 @@ Connection::Handle Connection::newHandle() const {
   CURL* const handle = owned.get();
   if (handle == nullptr) throw std::bad_alloc();
   set(handle, CURLOPT_SHARE, shared_.get());
-  // A look-up of a name that hangs is left behind, not waited for.
+  // Do not wait for a name look-up that hangs.
   set(handle, CURLOPT_QUICK_EXIT, 1L);
   set(handle, CURLOPT_PROTOCOLS_STR, configuration.mayBePlain ? "https,http" : "https");
   set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
@@ -77,11 +77,11 @@ Connection::Handle Connection::newHandle() const {
   set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
   if (!configuration.authority.empty()) {
     set(handle, CURLOPT_CAINFO, configuration.authority.c_str());
-    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // not the system's as well
+    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // do not trust the system's as well
   }
   setText(handle, CURLOPT_SSLCERT, configuration.certificate);
   setText(handle, CURLOPT_SSLKEY, configuration.key);
-  set(handle, CURLOPT_KEYPASSWD, "");  // instead of asking on a terminal
+  set(handle, CURLOPT_KEYPASSWD, "");  // do not ask for it on a terminal
   set(handle, CURLOPT_CONNECTTIMEOUT, static_cast<long>(configuration.connect.count()));
   set(handle, CURLOPT_LOW_SPEED_LIMIT, kSlowest);
   set(handle, CURLOPT_LOW_SPEED_TIME, static_cast<long>(configuration.stall.count()));
@@ -96,7 +96,7 @@ Connection::Handle Connection::newHandle() const {
 Expected<Answer> Connection::put(const std::string& url, const std::vector<std::string>& headers,
                                  std::string_view body, std::chrono::milliseconds longest,
                                  const GoOn& goOn) {
-  // libcurl takes 0 for no limit.
+  // To libcurl, 0 means that there is no limit.
   if (longest <= std::chrono::milliseconds(0)) return Error{"no time is left"};
   std::unique_ptr<curl_slist, void (*)(curl_slist*)> list(nullptr, curl_slist_free_all);
   const auto add = [&](const std::string& header) {

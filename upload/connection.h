@@ -1,4 +1,4 @@
-// The way to the server: HTTP/1.1 over TLS, by libcurl. One connection serves all logs.
+// The connection to the server: HTTP/1.1 over TLS with libcurl. One connection serves all logs.
 #pragma once
 
 #include <chrono>
@@ -15,33 +15,33 @@
 
 namespace tavrel::upload {
 
-/// The names of the header that a log's digest goes out in, and of the one that it comes back in.
+/// The header that sends a log's digest, and the one that returns it.
 inline constexpr const char* kDigestHeader = "Content-Digest";
 inline constexpr const char* kReceivedHeader = "Tavrel-Received";
 
-/// What the server says, once its answer is complete.
+/// The server's complete answer.
 struct Answer {
   long status = 0;
-  std::string received;         // the header that tells that a log has arrived; empty without it
+  std::string received;         // the header that confirms that a log has arrived; empty without it
   std::string location;         // where a redirect points
   std::int64_t retryAfter = 0;  // seconds; 0 when the server does not say
 };
 
 class Connection {
  public:
-  /// Borrows `configuration`.
+  /// `configuration` must outlive the object.
   explicit Connection(const Configuration& configuration);
 
-  /// Asked about once a second while a log is sent; false ends the transfer.
+  /// Called about once a second while a log is sent; returning false aborts the transfer.
   using GoOn = std::function<bool()>;
 
-  /// Puts `body` at `url`, in at most `longest`. An error when there is no whole answer: the server
-  /// may have the log or not.
+  /// Sends `body` to `url` with PUT, in at most `longest`. An error when no complete answer
+  /// arrives; the server may or may not have the log then.
   Expected<Answer> put(const std::string& url, const std::vector<std::string>& headers,
                        std::string_view body, std::chrono::milliseconds longest, const GoOn& goOn);
 
-  /// Whether the last error was about the device's own certificate, key or authorities, which no
-  /// later attempt cures.
+  /// Whether the last error concerned the device's own certificate, key or authorities, so that
+  /// further attempts cannot succeed.
   bool isMisconfigured() const { return isMisconfigured_; }
 
  private:

@@ -16,7 +16,7 @@ constexpr std::pair<std::string_view, std::string_view> kTexts[] = {
     {kLogMetadataName, "Tavrel-Log-Name: "},
     {kLogMetadataVersion, "Tavrel-OS-Version: "}};
 
-// "key=value&key=value", in the order of the keys. What does not fit is left out.
+// "key=value&key=value", in the order of the keys. Entries that do not fit are left out.
 std::string optionsText(const plist::Dictionary& options) {
   std::vector<std::string> entries;
   for (const auto& [key, value] : options) {

@@ -9,10 +9,10 @@
 
 namespace tavrel::upload {
 
-/// Printable ASCII as it is, but "%XX" for '%', for each byte of `also` and for each other byte.
+/// Encodes '%', each byte of `also` and everything but printable ASCII as "%XX".
 std::string percentEncoded(std::string_view text, std::string_view also = {});
 
-/// "Name: value" each, for what the metadata has. The dictionary may be an empty handle.
+/// One "Name: value" for each known entry of the metadata, which may be an empty handle.
 std::vector<std::string> metadataHeaders(const plist::Dictionary& metadata);
 
 }  // namespace tavrel::upload

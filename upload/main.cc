@@ -1,4 +1,4 @@
-// tavrel-upload: sends the logs that wait to a server, once.
+// tavrel-upload: sends waiting logs to a server, once.
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -15,7 +15,7 @@
 namespace tavrel::upload {
 namespace {
 
-// For scripts and units; tavrel-upload(8) lists them. The last two are those of sysexits.h.
+// For scripts and units; listed in tavrel-upload(8). The last two are those of sysexits.h.
 enum ExitStatus : int { kDone = 0, kFailed = 1, kMisused = 2, kWaits = 75, kMisconfigured = 78 };
 
 constexpr const char* kHelp =
@@ -102,7 +102,7 @@ int run(int argc, char** argv) {
 int main(int argc, char** argv) try {
   return tavrel::upload::run(argc, argv);
 } catch (const std::exception&) {
-  // A message takes memory, of which there is none left.
+  // A formatted message would take memory, and none is left.
   std::fputs("tavrel-upload: out of memory\n", stderr);
   return 1;
 }

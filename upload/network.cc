@@ -14,11 +14,11 @@
 namespace tavrel::upload {
 namespace {
 
-// Flags of both tables, from linux/route.h.
+// flags of both tables, from linux/route.h
 constexpr std::uint32_t kIsUp = 0x0001;
 constexpr std::uint32_t kRejects = 0x0200;
 
-/// Where a table has what is needed, in columns that white space separates.
+/// The columns of a routing table, which white space separates, that have the needed data.
 struct Table {
   const char* path;
   std::size_t columns;

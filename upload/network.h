@@ -1,4 +1,4 @@
-// Whether there is a network that may be used, by the kernel's tables of routes.
+// Finds out from the kernel's routing tables whether a usable network is available.
 #pragma once
 
 #include <string>
@@ -9,8 +9,8 @@
 
 namespace tavrel::upload {
 
-/// Why nothing may be sent now, such as "there is no default route"; empty when it may. A server on
-/// this machine can always be reached.
+/// Why nothing may be sent now, such as "there is no default route"; empty when sending is allowed.
+/// A server on this machine can always be reached.
 std::string reasonToWait(const DeviceRoot& root, FileSystem& files,
                          const Configuration& configuration);
 

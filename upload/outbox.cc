@@ -59,7 +59,7 @@ Expected<std::vector<WaitingLog>> Outbox::logsIn(std::string_view place,
       logs.push_back({filed, std::move(file)});
     } else if (file.ends_with(kLogMetadataEnding)) {
       file.resize(file.size() - kLogMetadataEnding.size());
-      // In the order of names a log comes right before its metadata.
+      // Sorted by name, a log comes right before its metadata.
       if (logs.empty() || logs.back().name != file) orphans.push_back(std::move(file));
     }
   }
@@ -73,8 +73,8 @@ Expected<std::vector<WaitingLog>> Outbox::logs() {
   std::vector<std::string> orphans;
   auto logs = logsIn(kOutbox, orphans);
   for (const std::string& name : orphans) {
-    // The log of new metadata is about to come from pending: it is looked for there first, because
-    // it never goes back.
+    // The log of new metadata may be about to arrive from pending/. Look for it there first,
+    // because a log never moves back.
     if (!FileSystem::status(path(kPending, name, kLogEnding)) &&
         !FileSystem::status(logPath(name))) {
       files_.discard(metadataPath(name));

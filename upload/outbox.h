@@ -1,6 +1,6 @@
-// The folders of submitted logs, as the one who empties them sees them.
+// The folders of submitted logs, for the program that empties them.
 //
-// A log leaves before its metadata, so that each log that can be seen has its metadata.
+// A log is removed before its metadata, so that every log that can be seen has its metadata.
 #pragma once
 
 #include <cstddef>
@@ -18,41 +18,41 @@ namespace tavrel::upload {
 
 struct WaitingLog {
   std::int64_t filed;  // seconds since 1970, UTC
-  std::string name;    // of its file, without the ending
+  std::string name;    // of its file, without the extension
 };
 
 class Outbox {
  public:
   Outbox(const DeviceRoot& root, FileSystem& files);
 
-  /// The folder above all others.
+  /// The folder that contains all the others.
   const std::string& folder() const { return folder_; }
   std::string logPath(std::string_view name) const;
   std::string metadataPath(std::string_view name) const;
 
-  /// The logs of the outbox, oldest first. Opens no file. Removes metadata whose log is gone.
+  /// The logs in the outbox, oldest first. Opens no file. Removes metadata whose log is gone.
   Expected<std::vector<WaitingLog>> logs();
 
-  /// Moves what waits in pending/ to the outbox, as long as `mayMove` says so, which is asked for
-  /// each log while nobody else can move it. A log that cannot be moved does not keep others; the
-  /// first failure is reported.
+  /// Moves waiting logs from pending/ to the outbox as long as `mayMove` returns true; it is called
+  /// for each log at a time when nobody else can move that log. A log that cannot be moved does not
+  /// stop the others; the first failure is returned.
   Status takePending(const std::function<bool()>& mayMove);
 
-  /// Removes a log of the outbox. One that is gone already is fine.
+  /// Removes a log from the outbox. It may already be gone.
   Status remove(std::string_view name);
 
-  /// Moves a log of the outbox into refused/, where the newest `limits::kRefusedLogs` stay, of
-  /// `limits::kRefusedBytes` together.
+  /// Moves a log from the outbox to refused/, which keeps the newest `limits::kRefusedLogs` logs of
+  /// at most `limits::kRefusedBytes` in total.
   Status refuse(std::string_view name);
 
-  /// Removes all logs that wait, in pending/ too; yields how many.
+  /// Removes all waiting logs, also those in pending/, and returns their number.
   Expected<std::size_t> removeAll();
 
  private:
   std::string path(std::string_view place, std::string_view name, std::string_view ending) const;
   Expected<std::vector<WaitingLog>> logsIn(std::string_view place,
                                            std::vector<std::string>& orphans);
-  /// The caller has the folder locked.
+  /// The caller must hold the folder's lock.
   Status move(std::string_view name, std::string_view from, std::string_view to);
   Status removeFrom(std::string_view place, std::string_view name);
   Status boundRefused();

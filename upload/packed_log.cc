@@ -21,7 +21,7 @@ namespace tavrel::upload {
 namespace {
 
 constexpr std::size_t kPiece = 64U << 10;
-constexpr int kGzip = 16;  // added to the size of the window, selects gzip's form
+constexpr int kGzip = 16;  // added to the window size to select gzip's format
 
 FileStamp stampFrom(const struct stat& status) {
   return {status.st_dev, status.st_ino, status.st_size, status.st_mtim.tv_sec,
@@ -77,7 +77,7 @@ LogPacker::LogPacker() : stream_(new z_stream{}, end) {
 PackedLog LogPacker::pack(ByteSpan content, const FileStamp& stamp) {
   PackedLog log{{}, {}, stamp};
   deflateReset(stream_.get());
-  // zlib does not write there.
+  // zlib does not write to its input.
   auto* const bytes = const_cast<std::byte*>(content.data());
   stream_->next_in = reinterpret_cast<unsigned char*>(bytes);
   stream_->avail_in = static_cast<unsigned>(content.size());

@@ -1,4 +1,4 @@
-// A log as it is read, and as it travels: compressed, with a digest.
+// A log as read from its file, and as sent: compressed, with a digest.
 #pragma once
 
 #include <cstdint>
@@ -14,7 +14,7 @@ struct z_stream_s;
 
 namespace tavrel::upload {
 
-/// Tells whether a file is still the one that was read.
+/// Identifies the state of a file, to detect whether it has changed since it was read.
 struct FileStamp {
   dev_t device;
   ino_t inode;
@@ -25,7 +25,7 @@ struct FileStamp {
   bool operator==(const FileStamp&) const = default;
 };
 
-/// The stamp of a regular file; nothing for a missing one, or anything else.
+/// The stamp of a regular file; nothing when it is missing or anything else.
 std::optional<FileStamp> stampOf(const std::string& path);
 
 struct ReadLog {
@@ -33,16 +33,16 @@ struct ReadLog {
   FileStamp stamp;
 };
 
-/// Nothing when there is no such file. Of a log that grows meanwhile, any beginning.
+/// Nothing when there is no such file. A log that grows meanwhile yields some beginning of it.
 Expected<std::optional<ReadLog>> readLog(const std::string& path);
 
 struct PackedLog {
-  std::string content;  // in gzip's form
-  std::string digest;   // of `content`, as the header Content-Digest has it (RFC 9530)
+  std::string content;  // compressed with gzip
+  std::string digest;   // of `content`, in the format of the Content-Digest header (RFC 9530)
   FileStamp stamp;
 };
 
-/// Keeps the compressor's memory from log to log.
+/// Compresses logs, reusing its memory from one to the next.
 class LogPacker {
  public:
   LogPacker();

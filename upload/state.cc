@@ -24,7 +24,7 @@ constexpr std::pair<const char*, std::int64_t State::*> kCounts[] = {
     {"Refused", &State::refused}};
 constexpr const char* kFailureKey = "Failure";
 
-// How much longer than the server asks for a device may wait, as a part of it.
+// How much longer than the server asks a device may wait, as a fraction of that delay.
 constexpr double kSpread = 0.1;
 
 }  // namespace
@@ -36,7 +36,7 @@ State readState(FileSystem& files, PropertyListCoding& propertyLists, SystemLog&
   for (const auto& [key, member] : kDates)
     state.*member = stored.date(key);
   for (const auto& [key, member] : kCounts) {
-    // Room for the additions of a run.
+    // Leaves room for what a run adds.
     constexpr std::int64_t kMost = std::int64_t{1} << 62;
     const auto number = stored.number(key);
     state.*member = number ? std::clamp<std::int64_t>(number->int64(), 0, kMost) : 0;

@@ -35,7 +35,7 @@ double chance() {
   return number / 4294967295.0;
 }
 
-// Names that the system gives, which are safe in addresses and on the server's disk.
+// Accepts only names that the system itself gives: they are safe in URLs and on the server's disk.
 bool isPlain(std::string_view name) {
   return parseLogFileName(name) && std::all_of(name.begin(), name.end(), [](char c) {
            return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
@@ -43,7 +43,7 @@ bool isPlain(std::string_view name) {
          });
 }
 
-// Keeps runs apart; nothing while another process has it.
+// Prevents concurrent runs; nothing while another process holds the lock.
 Expected<std::optional<Descriptor>> lockRun(const Services& services) {
   const std::string path = services.root.path(kLockPath);
   if (Status made = services.files.makeFolders(path.substr(0, path.rfind('/'))); !made) {
@@ -79,7 +79,7 @@ void noteFailure(const Services& services, std::string_view why) {
 }
 
 Uploader::Permission Uploader::permission() {
-  // Read again: whoever withdraws it is another process.
+  // Reread preferences, because another process may have withdrawn the permission.
   services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
   bool isThere = false;
   services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain,
@@ -111,7 +111,7 @@ Outcome Uploader::run(bool atOnce) {
   if (!complaint_.empty()) {
     state_.failure = complaint_;
     state_.lastFailure = services_.clock.now();
-    // A transfer that waits is tried again, whatever else is not in order.
+    // Keep `Waits`: the transfer is tried again, whatever else is wrong.
     if (outcome == Outcome::Done) outcome = Outcome::Failed;
   }
   if (failed_ || !complaint_.empty()) ++state_.failedAttempts;
@@ -193,7 +193,7 @@ Outcome Uploader::sendAll(std::vector<WaitingLog> logs) {
           return Outcome::Misconfigured;
       }
     }
-    // What came meanwhile, and what was changed. A pass that sends nothing is the last.
+    // List again: logs may have arrived or changed meanwhile. Stop after a pass that sends nothing.
     if (sent_ + refused_ == before) break;
     auto more = outbox_.logs();
     if (!more) {
@@ -244,7 +244,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   return failToSend(log, answer.error().message);
 }
 
-// A log without readable metadata is sent without.
+// A log whose metadata is unreadable is sent without metadata.
 plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
   const auto bytes =
       services_.files.readIfPresent(outbox_.metadataPath(log.name), limits::kPropertyListBytes);
@@ -254,13 +254,13 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
 }
 
 Expected<std::optional<Uploader::ReadyLog>> Uploader::prepare(const WaitingLog& log) {
-  // Once, so that what is sent is what the permission is asked for.
+  // Read the log only once, so that the permission is checked for exactly what is sent.
   const auto read = readLog(outbox_.logPath(log.name));
   if (!read) return read.error();
   if (!*read) return std::optional<ReadyLog>();
   const auto& [content, stamp] = **read;
   const std::optional<std::int64_t> day = dayOfLog(content, services_.propertyLists);
-  // The submission service judges a log without statistics by the day on which it was made, too.
+  // Like the submission service, judge a log without statistics by the day on which it was made.
   const std::int64_t filed = daysFromCivil(civilFromSeconds(log.filed).date);
   return std::optional(ReadyLog{packer_.pack(asBytes(content), stamp), day.value_or(filed)});
 }

@@ -1,8 +1,8 @@
-// One run of the uploader: sends the logs of the outbox, one at a time, oldest first.
+// One run of the uploader: sends the logs in the outbox, one at a time, oldest first.
 //
-// A log is removed only once the server has confirmed it, and given up only when the server says
-// that it is the log's own fault (413, 422). Whatever else happens, it stays; at worst the server
-// gets it once more under the same name.
+// A log is removed only once the server has confirmed it, and given up only when the server
+// blames the log itself (413, 422). Otherwise it stays; at worst, the server receives it
+// again under the same name.
 #pragma once
 
 #include <chrono>
@@ -27,7 +27,7 @@
 
 namespace tavrel::upload {
 
-/// What an uploader needs of the system; all of it outlives the uploader.
+/// The system services that an uploader needs. All of them must outlive it.
 struct Services {
   const DeviceRoot& root;
   FileSystem& files;
@@ -37,14 +37,14 @@ struct Services {
   SystemLog& log;
 };
 
-/// Keeps for `tavrelctl status --check` why a run could not even begin; nothing while another run
-/// is on, which keeps how it ends itself.
+/// Records, for `tavrelctl status --check`, why a run could not even begin. Does nothing while
+/// another run is active, because that one records its own outcome.
 void noteFailure(const Services& services, std::string_view why);
 
 enum class Outcome {
   Done,           // nothing is left to do
-  Waits,          // logs wait for a later run
-  Failed,         // something on the device is not in order
+  Waits,          // logs are left for a later run
+  Failed,         // something is wrong on the device
   Misconfigured,  // no log can be sent until somebody corrects a credential
 };
 
@@ -52,24 +52,24 @@ class Uploader {
  public:
   Uploader(const Services& services, const Configuration& configuration);
 
-  /// With `atOnce` an earlier failure does not make it wait. Ends quietly while another run is on.
+  /// With `atOnce`, ignores the pause after a failure. Returns quietly if another run is active.
   Outcome run(bool atOnce);
 
  private:
   enum class Permission { Given, Withdrawn, NotGiven };
   struct ReadyLog {
     PackedLog packed;
-    std::int64_t day;  // that the permission must cover
+    std::int64_t day;  // which the permission must cover
   };
   enum class Step { Next, Held, Stop, Broken, Withdrawn, Misconfigured };
 
-  /// Reads `permitted_` again. `NotGiven` also when its first day is not a day.
+  /// Rereads `permitted_`. `NotGiven` also when its first day is not a valid day.
   Permission permission();
   Outcome runLocked(bool atOnce);
   Outcome sendAll(std::vector<WaitingLog> logs);
   Step send(const WaitingLog& log);
   plist::Dictionary metadataOf(const WaitingLog& log);
-  /// Nothing when the log has gone.
+  /// Nothing when the log is gone.
   Expected<std::optional<ReadyLog>> prepare(const WaitingLog& log);
   /// Whether a log of `day` may be sent now; `Next` when it may.
   Step askPermission(std::int64_t day);
@@ -78,10 +78,10 @@ class Uploader {
   Step giveUp(const WaitingLog& log, long status);
   Step failToSend(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
   Step failToMove(const Error& error);
-  /// Notes the failure, and when the next attempt is.
+  /// Notes the failure and the time of the next attempt.
   void fail(std::string line, std::int64_t serverWish);
   void succeed();
-  /// Something on the device itself is in the way.
+  /// Notes that something on the device itself prevents success.
   void complain(std::string_view line);
   Outcome removeWaiting();
   std::chrono::milliseconds timeLeft() const;
@@ -94,10 +94,10 @@ class Uploader {
   const std::string statePath_;
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
   State state_;
-  SubmissionPermission permitted_;  // as of the last look
+  SubmissionPermission permitted_;  // when last read
   std::size_t sent_ = 0;
   std::size_t refused_ = 0;
-  std::size_t held_ = 0;  // of the last pass, whose day is not permitted
+  std::size_t held_ = 0;  // in the last pass, because the permission does not cover their day
   bool tried_ = false;
   bool failed_ = false;    // a transfer
   std::string complaint_;  // the first of this run
