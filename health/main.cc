@@ -1,4 +1,4 @@
-// tavrel-health: reads the health of all drives once, with the rights that only this takes.
+// tavrel-health: reads the health of all drives once, with only the rights that this needs.
 #include <cstdio>
 #include <exception>
 
@@ -7,8 +7,8 @@
 #include "platform/linux/process/linux_clock.h"
 #include "platform/linux/system_log/linux_system_log.h"
 
-// Exit status 1 when a reading or the memory could not be written. A drive that cannot be read has
-// a reading that says so.
+// Exits with 1 when a reading or the memory could not be written. For a drive that cannot be
+// read, the reading says so.
 int main() try {
   using namespace tavrel;
   LinuxSystemLog log;
@@ -28,7 +28,7 @@ int main() try {
   }
   return 1;
 } catch (const std::exception&) {
-  // A message takes memory, of which there is none left.
+  // A formatted message would take memory, and none is left.
   std::fputs("tavrel-health: out of memory\n", stderr);
   return 1;
 }

@@ -1,15 +1,15 @@
-// libcurl's start, and the connection that transfers share.
+// Starts libcurl, and holds the connection that transfers share.
 //
-// Each transfer has a handle of its own, because libcurl 7.88, used again, takes a folded line at
-// the beginning of an answer's headers for part of the last header of the answer before, which it
-// has freed.
+// Each transfer needs its own handle: when one is reused, libcurl 7.88 takes a folded line
+// at the beginning of an answer's headers as part of the previous answer's last header,
+// which it has already freed.
 #pragma once
 
 #include <memory>
 
 namespace tavrel {
 
-/// Outlives the handles that use it. Throws `std::bad_alloc` when libcurl cannot start.
+/// Must outlive the handles that use it. Throws `std::bad_alloc` when libcurl cannot start.
 class CurlShare {
  public:
   CurlShare();
@@ -17,7 +17,7 @@ class CurlShare {
   CurlShare(const CurlShare&) = delete;
   CurlShare& operator=(const CurlShare&) = delete;
 
-  /// For the option CURLOPT_SHARE.
+  /// The value for the option CURLOPT_SHARE.
   void* get() const { return share_.get(); }
 
  private:

@@ -41,7 +41,7 @@ void complain(std::string_view message) {
   std::fprintf(stderr, "tavrel-statsd: %s\n", std::string(message).c_str());
 }
 
-// An exit status when the program is not to run.
+// An exit status when the program must not run.
 std::optional<int> parseOptions(int argc, char** argv, Options& options) {
   enum : int { kUdp = 256, kUnix, kPrefix, kIdle, kShowHelp, kVersion };
   constexpr option kOptions[] = {{"udp", required_argument, nullptr, kUdp},
@@ -123,7 +123,7 @@ int run(int argc, char** argv) {
     return 1;
   }
   StatsdRecorder recorder(options.prefix);
-  // Datagrams are taken anyway: the library tries again while the program runs.
+  // If recording fails, take datagrams anyway: the library retries while the program runs.
   const char* why = nullptr;
   if (BHClientGetStatus(&why) != BHClientStatusRecording) complain(why);
 
@@ -144,7 +144,7 @@ int run(int argc, char** argv) {
 int main(int argc, char** argv) try {
   return tavrel::run(argc, argv);
 } catch (const std::exception&) {
-  // What goes wrong is returned, except that memory runs out.
+  // All other failures are returned; only memory can run out.
   std::fputs("tavrel-statsd: out of memory\n", stderr);
   return 1;
 }

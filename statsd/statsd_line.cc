@@ -29,7 +29,7 @@ bool parseRate(std::string_view text, double& rate) {
   return parseFinite(text, rate) && rate > 0 && rate <= 1;
 }
 
-// Fields with tags, the sender's container or its time.
+// Fields for tags, the sender's container or its time.
 bool isIgnoredField(std::string_view field) {
   return field.starts_with('#') || field.starts_with('T') || field.starts_with("c:") ||
          field.starts_with("e:") || field.starts_with("card:");

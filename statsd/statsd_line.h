@@ -1,4 +1,4 @@
-// Lines of the StatsD protocol: NAME:VALUE|TYPE, then fields that begin with "|".
+// Lines of the StatsD protocol: NAME:VALUE|TYPE, then further fields, each after a "|".
 //
 //   StatsdLine line;
 //   if (parseStatsdLine("requests:1|c|@0.1", line) == StatsdParse::Good) use(line);
@@ -24,16 +24,16 @@ enum class StatsdParse : std::uint8_t {
 };
 
 struct StatsdLine {
-  /// Not empty; without tags. Refers to the line that was parsed.
+  /// Not empty, and without tags. Points into the parsed line.
   std::string_view name;
   StatsdKind kind;
   /// One or more, all finite. Gauges have one.
   std::vector<double> values;
-  /// The part of all events that was sent, above 0 and up to 1.
+  /// The fraction of all events that the client sent, above 0 and at most 1.
   double rate;
 };
 
-/// Parses one line without its end. `result` has a meaning only when the outcome is good.
+/// Parses one line, without its line end. `result` is meaningful only when the outcome is Good.
 StatsdParse parseStatsdLine(std::string_view text, StatsdLine& result);
 
 }  // namespace tavrel

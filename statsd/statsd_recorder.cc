@@ -11,8 +11,8 @@ namespace {
 
 constexpr std::size_t kLongestPrefix = 200;
 
-// How often the measurements of a line are recorded at most, unless there are more of them. A
-// sender must not fill the segment with one line; no client samples more thinly.
+// At most this many copies of a line's measurements are recorded, unless the line has more values.
+// One line must not let a sender fill the segment; no client samples more sparsely than this.
 constexpr double kMostCopies = 1000;
 
 constexpr const char* kFaultNames[] = {"malformed", "unsupported", "refused", "too_long"};
@@ -23,8 +23,8 @@ constexpr bool isKeyCharacter(char character) {
          character == '-';
 }
 
-// The whole part of `value`; the rest waits in `remainder`. What lies a rounding error below a
-// whole number, as ten times a tenth may, counts as that number.
+// Returns the whole part of `value` and keeps the rest in `remainder`. A sum that lies only a
+// rounding error below a whole number, as ten times 0.1 may, counts as that number.
 std::int64_t takeWhole(double value, double& remainder) {
   constexpr double kRoundingError = 1e-9;
   const double sum = value + remainder;

@@ -14,32 +14,32 @@
 
 namespace tavrel {
 
-/// The key of a name: letters, digits, ".", "_" and "-" stay, each other byte becomes "_".
+/// Turns a name into a key: letters, digits, ".", "_" and "-" stay; any other byte becomes "_".
 void appendStatsdKey(std::string& key, std::string_view name);
 
 /// What the program records about itself, under PREFIX "tavrel-statsd.".
 enum class StatsdFault : std::uint8_t {
   Malformed,    // lines
   Unsupported,  // lines
-  Refused,      // lines whose key is too long or one too many
+  Refused,      // lines whose key is too long or exceeds the number of keys
   TooLong,      // datagrams
 };
 
 class StatsdRecorder {
  public:
-  /// A prefix is text that `isStatsdPrefix` accepts.
+  /// `prefix` must be text that `isStatsdPrefix` accepts.
   explicit StatsdRecorder(std::string prefix);
 
-  /// Lines, separated by line ends.
+  /// Takes lines that are separated by line ends.
   void take(std::string_view datagram);
-  /// Counts what was not recorded.
+  /// Counts something that was not recorded.
   void count(StatsdFault fault) const;
 
  private:
   struct Key {
     BHClientScalarKey* scalar = nullptr;
     BHClientDistributionKey* series = nullptr;
-    double remainder = 0;  // of a scalar: what is below one, or of a series: of its copies
+    double remainder = 0;  // of a scalar: the fraction below one; of a series: that of its copies
   };
   struct Hash {
     using is_transparent = void;
@@ -54,7 +54,7 @@ class StatsdRecorder {
   Key* find(Keys& keys, std::string_view name);
 
   std::string prefix_;
-  std::string name_;  // the key that is looked up
+  std::string name_;  // the key being looked up
   StatsdLine line_;
   Keys scalars_;
   Keys series_;
@@ -63,7 +63,7 @@ class StatsdRecorder {
   std::array<BHClientScalarKey*, 4> faults_;
 };
 
-/// Whether keys may begin with the text: letters, digits, ".", "_" and "-", up to 200 bytes.
+/// Whether the text may be the prefix of keys: letters, digits, ".", "_" and "-", up to 200 bytes.
 bool isStatsdPrefix(std::string_view text);
 
 }  // namespace tavrel

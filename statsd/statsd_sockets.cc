@@ -21,10 +21,10 @@ namespace {
 
 constexpr int kMostSockets = 16;
 
-// Datagrams per system call.
+// datagrams per system call
 constexpr unsigned kBatch = 32;
 
-// Bytes that the kernel keeps while the program is busy or starts. It grants what its limit allows.
+// Bytes that the kernel buffers while the program is busy or starting; the kernel may grant less.
 constexpr int kReceiveBuffer = 1 << 20;
 
 bool isDatagramSocket(int descriptor) {
@@ -62,7 +62,7 @@ Expected<DatagramSocket> newSocket(int family) {
   return made;
 }
 
-// Whether the path is a socket that refuses connections: its program has ended.
+// Whether the path is a socket that refuses connections because its program has ended.
 bool isAbandoned(const sockaddr_un& address) {
   struct stat status {};
   if (lstat(address.sun_path, &status) != 0 || !S_ISSOCK(status.st_mode)) return false;
@@ -71,7 +71,7 @@ bool isAbandoned(const sockaddr_un& address) {
   return probe && connect(probe->descriptor(), any, sizeof address) != 0 && errno == ECONNREFUSED;
 }
 
-// Room for a batch, where the kernel writes.
+// The buffers that the kernel fills with a batch.
 class Batch {
  public:
   Batch() : bytes_(new char[kBatch][kLongestDatagram]) {
@@ -83,7 +83,7 @@ class Batch {
     }
   }
 
-  // The number of datagrams; 0 when none waits, -1 with errno.
+  // The number of datagrams received: 0 when none is waiting, -1 with errno set on failure.
   int receive(int descriptor) {
     int count = 0;
     do {

@@ -1,4 +1,4 @@
-// Datagram sockets: those of the service manager, or ones that the program opens.
+// Datagram sockets: from the service manager, or opened by the program.
 #pragma once
 
 #include <chrono>
@@ -13,7 +13,7 @@
 
 namespace tavrel {
 
-/// A descriptor of a socket, closed at the end.
+/// Owns the descriptor of a socket.
 class DatagramSocket {
  public:
   explicit DatagramSocket(int descriptor) : descriptor_(descriptor) {}
@@ -29,28 +29,28 @@ class DatagramSocket {
   int descriptor_;
 };
 
-/// The sockets that LISTEN_PID and LISTEN_FDS of the environment hand over; none when they are for
-/// no one or another process. An error when one is not a datagram socket.
+/// The sockets that the environment passes in LISTEN_PID and LISTEN_FDS; none when the variables
+/// are missing or meant for another process. An error when one is not a datagram socket.
 Expected<std::vector<DatagramSocket>> activatedDatagramSockets();
 
-/// A socket at a port of the loopback address 127.0.0.1; 0 is any free one.
+/// Opens a port of the loopback address 127.0.0.1; 0 stands for any free port.
 Expected<DatagramSocket> openLoopbackSocket(std::uint16_t port);
 
-/// A Unix socket that everybody may send to. A socket at the path that nobody listens to any more
-/// is replaced.
+/// Opens a Unix socket that everybody may send to. Replaces a socket at the path if
+/// nobody listens on it any more.
 Expected<DatagramSocket> openUnixSocket(const std::string& path);
 
-/// Bytes of a datagram. Clients fill an Ethernet packet, some a jumbo frame of 9,000 bytes at most.
+/// Bytes of a datagram. Clients fill an Ethernet packet or, at most, a jumbo frame of 9,000 bytes.
 inline constexpr std::size_t kLongestDatagram = 9216;
 
 struct DatagramHandlers {
   std::function<void(std::string_view datagram)> take;
-  /// A datagram was longer than `kLongestDatagram`, and is lost.
+  /// Called when a datagram was longer than `kLongestDatagram` and is lost.
   std::function<void()> dropTooLong;
 };
 
-/// Receives until there was no datagram for `idle`; without it for ever. An error when a socket
-/// fails.
+/// Receives until no datagram has arrived for `idle`, or for ever without it. An
+/// error when a socket fails.
 Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
                         std::optional<std::chrono::milliseconds> idle,
                         const DatagramHandlers& handlers);
