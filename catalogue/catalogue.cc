@@ -48,8 +48,8 @@ std::size_t literalLength(std::string_view pattern) {
 
 // `rows` are sorted by their prefixes.
 const Entry* findRow(std::span<const Entry> rows, std::string_view name) {
-  // Prefixes that begin `probe` come before all that are greater than it, so the last one that is
-  // not greater either begins it or shares with it what a shorter one could be.
+  // Prefixes of `probe` sort before everything greater than it. So the last row that is not greater
+  // is one of them, or has in common with `probe` all that a shorter one could be.
   std::string_view probe = name;
   while (true) {
     const auto end = std::ranges::upper_bound(rows, probe, {}, prefixOf);
@@ -71,7 +71,7 @@ const Entry* findRow(std::span<const Entry> rows, std::string_view name) {
   }
 }
 
-// The second channel of a name ends in "#2".
+// The second channel of the same name ends in "#2".
 const Entry* find(std::span<const Entry> rows, std::string_view name) {
   const std::size_t mark = name.find_last_not_of("0123456789");
   const bool isNumbered = mark < name.size() - 1 && name[mark] == '#';

@@ -2,9 +2,9 @@
 #
 #   cmake -DDOCUMENTS=docs/catalogue -DOUTPUT=catalogue_rows.inc -P rows.cmake
 #
-# The first column of a table says what it holds: `unit` and `since` the words that other tables may
-# use (README.md has these two), `key` statistics, `driver` report channels, `statistic` those of
-# the storage controller. What is wrong in a document ends the build with its file and line.
+# The first column of a table says what the table holds: `unit` and `since` the words that other
+# tables may use (both are in README.md), `key` statistics, `driver` report channels, `statistic`
+# those of the storage controller. A fault in a document ends the build with its file and line.
 cmake_minimum_required(VERSION 3.25)
 
 set(columns_of_unit unit meaning)
@@ -13,13 +13,13 @@ set(columns_of_key key unit since meaning)
 set(columns_of_driver driver group channel unit since daily meaning)
 set(columns_of_statistic statistic unit since meaning)
 
-# What a daily channel is stored under begins so.
+# The keys of statistics from daily channels begin like this.
 set(daily_prefix "com.norvane.ioreport.")
 set(not_known "not known")
 
 string(ASCII 9 tab)
-# These stand for characters that have a meaning in CMake's lists: a semicolon, and others that no
-# cell may have.
+# Stand-ins for characters that are special in CMake's lists: a semicolon, and others
+# that no cell may contain.
 string(ASCII 1 semicolon)
 string(ASCII 2 other)
 
@@ -27,7 +27,7 @@ function(fail reason)
   message(FATAL_ERROR "${DOCUMENTS}/${document}:${line_number}: ${reason}")
 endfunction()
 
-# The cells of a row in variables `cell_COLUMN`, without the marks of code.
+# Puts the cells of a row into variables `cell_COLUMN`, without code marks.
 macro(take_cells)
   string(REGEX REPLACE "^\\|(.*)\\| *$" "\\1" inner "${line}")
   string(REPLACE "|" ";" cells "${inner}")
@@ -58,7 +58,7 @@ function(check_words)
   endif()
 endfunction()
 
-# Adds a row to those of an array. Its text begins with what it is sorted by.
+# Appends a row to an array. Its text begins with its sort key.
 function(add_row array driver group key)
   string(REGEX MATCHALL "<[a-z]+>" placeholders "${key}")
   list(LENGTH placeholders count)
@@ -115,7 +115,7 @@ function(take_row)
   endif()
 endfunction()
 
-# The columns that the head of a table must have, and the first of them as its `kind`.
+# Checks the columns in the head of a table, and sets `kind` to the first of them.
 macro(take_head)
   string(REGEX MATCHALL "[a-z]+" columns "${line}")
   list(GET columns 0 kind)

@@ -11,9 +11,9 @@
 namespace tavrel::page {
 namespace {
 
-// Of drawings, which are stretched to their place.
+// For drawings, which are stretched to fill their place.
 constexpr int kLength = 1000;
-// What is not 0 can be seen.
+// Keeps values other than 0 visible.
 constexpr int kLeastLength = 4;
 
 int barLength(double value, double largest) {
@@ -41,7 +41,7 @@ void writeRectangle(HtmlWriter& html, const Rectangle& rectangle, double opacity
   }
 }
 
-// Of part `index` among so many: neighbours differ, in any number and in both colour schemes.
+// The opacity of a part: neighbours differ, for any number and in both colour schemes.
 double opacityOf(std::size_t index, std::size_t count) {
   constexpr double kFaintest = 0.25;
   if (count < 2) return 1;

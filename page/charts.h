@@ -1,6 +1,6 @@
-// Charts as inline SVG with their texts as HTML around it, so that texts keep their size at any
-// width. Each chart has an accessible name, which also tells the figures that the eye would look
-// for first. Values that are not finite count as no data.
+// Charts as inline SVG, with their texts as HTML around it, so that texts keep their size at any
+// width. Each chart has an accessible name that also states the figures a reader would look for
+// first. Values that are not finite count as missing.
 #pragma once
 
 #include <functional>
@@ -17,11 +17,11 @@ namespace tavrel::page {
 /// How a chart writes its values; page/number_text.h has the usual ones.
 using NumberText = std::function<std::string(double value)>;
 
-/// Values over days. The line has gaps where there is no data; a value between gaps is a dot.
+/// Values over days. The line has gaps where data is missing; a value between gaps is a dot.
 struct LineChart {
   std::string name;                           // accessible
-  std::vector<std::optional<double>> values;  // a day each
-  /// Around the line, as from the lowest to the highest value of a day: of the same days, or empty.
+  std::vector<std::optional<double>> values;  // one per day
+  /// A band around the line, such as the extremes of each day: for the same days, or empty.
   std::vector<std::optional<double>> lows = {};
   std::vector<std::optional<double>> highs = {};
   std::string first;  // labels of the first and the last day
@@ -30,7 +30,7 @@ struct LineChart {
 };
 void writeLineChart(HtmlWriter& html, const LineChart& chart);
 
-/// Columns over neighbouring intervals.
+/// Columns over adjacent intervals.
 struct Histogram {
   std::string name;
   struct Cell {
@@ -43,10 +43,10 @@ struct Histogram {
 };
 void writeHistogram(HtmlWriter& html, const Histogram& histogram);
 
-/// Labelled bars, one a row; also for histograms whose intervals are of different widths.
+/// Labelled bars, one per row; also for histograms whose intervals differ in width.
 struct Bar {
   std::string label;
-  double value = 0;  // negative ones have no bar
+  double value = 0;  // negative values have no bar
   std::string text;
 };
 void writeBars(HtmlWriter& html, std::string_view name, std::span<const Bar> bars);
@@ -54,12 +54,12 @@ void writeBars(HtmlWriter& html, std::string_view name, std::span<const Bar> bar
 /// Parts of a whole in one bar, with a legend.
 struct Share {
   std::string label;
-  double share = 0;  // of 1
-  std::string text;  // behind the share in the legend; may be empty
+  double share = 0;  // a fraction of 1
+  std::string text;  // after the share in the legend; may be empty
 };
 void writeShares(HtmlWriter& html, std::string_view name, std::span<const Share> shares);
 
-/// Estimates with their intervals over one common scale, a row each, with a line at `reference`.
+/// Estimates with their intervals on a common scale, one per row, with a line at `reference`.
 struct IntervalChart {
   std::string name;
   struct Row {
@@ -70,7 +70,7 @@ struct IntervalChart {
   };
   std::vector<Row> rows;
   double reference = 0;
-  NumberText text;  // of the scale
+  NumberText text;  // for the scale
 };
 void writeIntervals(HtmlWriter& html, const IntervalChart& chart);
 

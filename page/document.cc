@@ -6,7 +6,7 @@
 namespace tavrel::page {
 namespace {
 
-// Should anything in a text ever become markup, it can neither run nor load anything.
+// If text ever became markup, it could neither run nor load anything.
 constexpr std::string_view kHead =
     "<!DOCTYPE html>\n<html lang=\"en\"><head><meta charset=\"utf-8\">"
     "<meta http-equiv=\"Content-Security-Policy\" "

@@ -1,5 +1,5 @@
 // A page as one file: head, table of contents, sections. It needs no network and no script, follows
-// the reader's light or dark scheme, prints, and reads well from 320 to 1,920 pixels.
+// the reader's light or dark scheme, can be printed, and works at widths from 320 to 1,920 pixels.
 //
 //   Document document("Device");
 //   document.head().element("p", "On 2026-11-25");
@@ -18,13 +18,13 @@ namespace tavrel::page {
 
 class Document {
  public:
-  /// `title` is also the page's heading.
+  /// `title` also becomes the page's heading.
   explicit Document(std::string title) : title_(std::move(title)) {}
 
-  /// What stands below the heading, before the table of contents.
+  /// Content below the heading, before the table of contents.
   HtmlWriter& head() { return head_; }
-  /// Begins a section; its heading stands in the table of contents. The writer lives as long as the
-  /// document.
+  /// Begins a section, whose heading also appears in the table of contents. The writer
+  /// lives as long as the document.
   HtmlWriter& section(std::string_view title);
 
   std::string text() const;

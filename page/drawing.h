@@ -1,4 +1,4 @@
-// What the charts have in common: an SVG image that is stretched to its place.
+// Code that all charts share: an SVG image that is stretched to fill its place.
 #pragma once
 
 #include <cstddef>
@@ -8,7 +8,7 @@
 
 namespace tavrel::page {
 
-/// Begins a drawing of so many units; `HtmlWriter::end` ends it. `name` is its accessible name.
+/// Begins a drawing, sized in units; `HtmlWriter::end` ends it. `name` is its accessible name.
 void beginDrawing(HtmlWriter& html, std::string_view name, std::size_t width, int height);
 
 }  // namespace tavrel::page

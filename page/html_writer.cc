@@ -5,13 +5,13 @@
 namespace tavrel::page {
 namespace {
 
-// Whether a byte can be copied in texts and in values between quotation marks.
+// Whether a byte can be copied as it is, both in text and in quoted values.
 bool isPlain(char character) {
   return isPrintableAscii(character) && character != '<' && character != '>' && character != '&' &&
          character != '"';
 }
 
-// Noncharacters, and controls other than line ends and tabs, must not stand in a document.
+// A document may not contain noncharacters, or controls other than line ends and tabs.
 char32_t shown(char32_t point) {
   constexpr char32_t kControlPictures = 0x2400;
   constexpr char32_t kDeletePicture = 0x2421;

@@ -1,4 +1,4 @@
-// Writes HTML and SVG as text. What comes from outside cannot become markup.
+// Writes HTML and SVG as text. Outside data cannot become markup.
 //
 //   HtmlWriter html;
 //   html.begin("p", {{"class", "note"}});
@@ -6,9 +6,9 @@
 //   html.end();
 //   html.element("td", anything);
 //
-// Names of elements and attributes are literals of the program and written as they are; texts and
-// values of attributes are escaped. Malformed UTF-8 is repaired. Characters that HTML does not
-// allow, and invisible ones that would show text in another order, become visible ones.
+// Names of elements and attributes are literals of the program and are written as they are; texts
+// and attribute values are escaped. Malformed UTF-8 is repaired. Characters that HTML does not
+// allow, and invisible ones that would reorder text, are replaced with visible ones.
 #pragma once
 
 #include <initializer_list>
@@ -18,7 +18,7 @@
 
 namespace tavrel::page {
 
-/// Borrows both. An attribute without a value is left out.
+/// Borrows both texts. An attribute with an empty value is left out.
 struct Attribute {
   std::string_view name;
   std::string_view value;
@@ -28,22 +28,22 @@ using Attributes = std::initializer_list<Attribute>;
 class HtmlWriter {
  public:
   void begin(const char* element, Attributes attributes = {});
-  /// Ends the element that was begun last.
+  /// Ends the innermost open element.
   void end();
 
   void text(std::string_view text);
-  /// A name from outside, such as a key: its direction does not affect the text around it, and long
-  /// ones wrap, at dots first.
+  /// Writes a name from outside, such as a key: its direction does not affect the text around it,
+  /// and long ones wrap, preferably at dots.
   void name(std::string_view name);
-  /// An element that holds only text.
+  /// Writes an element that holds only text.
   void element(const char* element, std::string_view text, Attributes attributes = {});
-  /// An element without content: of HTML one that has no end tag, of SVG any.
+  /// Writes an element without content: in HTML one that has no end tag, in SVG any.
   void empty(const char* element, Attributes attributes = {});
 
-  /// What another writer wrote whole.
+  /// Appends the whole output of another writer.
   void append(const HtmlWriter& other) { out_ += other.out_; }
 
-  /// All that was written. Elements that were begun must have been ended.
+  /// Everything written so far. All elements must have been ended.
   std::string_view written() const { return out_; }
 
  private:

@@ -63,7 +63,7 @@ void writeIntervals(HtmlWriter& html, const IntervalChart& chart) {
   html.begin("div", {{"class", "scale"}});
   html.begin("p");
   html.element("span", chart.text(scale.low));
-  // Near an end its label would be in the way.
+  // Near an end, its label would collide with that of the end.
   const double reference = static_cast<double>(scale.at(chart.reference)) / kLength;
   if (reference > 0.2 && reference < 0.8) {
     html.element("span", chart.text(chart.reference),

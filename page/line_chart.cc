@@ -11,7 +11,7 @@ namespace {
 
 using Values = std::vector<std::optional<double>>;
 
-constexpr int kHeight = 100;  // of the drawing; a day is one unit wide
+constexpr int kHeight = 100;  // of the drawing; one day is one unit wide
 
 struct Range {
   double low = 0, high = 0;
@@ -27,10 +27,10 @@ struct Range {
   }
 };
 
-// From top to bottom.
+// The position from top to bottom.
 int heightOf(double value, const Range& range) {
   if (range.low == range.high) return kHeight / 2;
-  // Halves keep the difference of large values finite.
+  // Halving first keeps the difference of large values finite.
   const double share = (value / 2 - range.low / 2) / (range.high / 2 - range.low / 2);
   return static_cast<int>(std::lround((1 - share) * kHeight));
 }
@@ -39,14 +39,14 @@ bool isTold(const Values& values, std::size_t day) {
   return day < values.size() && values[day] && std::isfinite(*values[day]);
 }
 
-// Where the days from `day` on end that have values without a gap.
+// Where the run of days with values that begins at `day` ends.
 std::size_t endOfRun(const Values& values, std::size_t day) {
   while (isTold(values, day))
     ++day;
   return day;
 }
 
-// The points of a run in relative steps, from its second one.
+// The points of a run from the second one on, as relative steps.
 void appendSteps(std::string& path, const Values& values, std::size_t begin, std::size_t end,
                  const Range& range) {
   int before = heightOf(*values[begin], range);
@@ -63,7 +63,7 @@ std::string linePath(const Values& values, const Range& range) {
     const std::size_t end = endOfRun(values, day);
     if (end == day) continue;
     appendFormat(path, "M%zu %d", day, heightOf(*values[day], range));
-    // A line of no length is a dot.
+    // A line of length 0 shows as a dot.
     if (end == day + 1) path += "h0";
     appendSteps(path, values, day, end, range);
     day = end;
@@ -71,7 +71,7 @@ std::string linePath(const Values& values, const Range& range) {
   return path;
 }
 
-// Areas along the lows and back along the highs.
+// Areas that run along the lows and back along the highs.
 std::string bandPath(const LineChart& chart, const Range& range) {
   std::string path;
   for (std::size_t day = 0; day < chart.lows.size(); ++day) {

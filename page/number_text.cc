@@ -11,11 +11,11 @@
 namespace tavrel::page {
 namespace {
 
-// They do not break.
+// Both are non-breaking.
 constexpr char kNarrowBlank[] = "\u202F";
 constexpr char kBlank[] = "\u00A0";
 
-// Groups the digits before the point; a number with an exponent stays as it is.
+// Groups the digits before the point; leaves a number with an exponent unchanged.
 std::string grouped(std::string_view digits) {
   std::string text;
   if (digits.starts_with('-')) {
@@ -31,7 +31,7 @@ std::string grouped(std::string_view digits) {
   return text.append(digits.substr(whole));
 }
 
-// A unit as catalogue/ names it, and its size in one that takes prefixes.
+// A unit as named in catalogue/, and its size in a base unit that takes prefixes.
 struct ScaledUnit {
   std::string_view name;
   double factor;
@@ -58,7 +58,7 @@ constexpr ScaledUnit kScaledUnits[] = {{"bytes", 1, kSize},
                                        {"microwatts", 1e-6, "W"},
                                        {"microjoules", 1e-6, "J"}};
 
-// Units of figures that are read without one.
+// Units that are not shown next to a figure.
 constexpr std::string_view kPlainUnits[] = {"", "count", "number", "state", "mask"};
 
 std::string timeText(double seconds) {

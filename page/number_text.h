@@ -7,14 +7,14 @@
 
 namespace tavrel::page {
 
-/// Whole numbers in full and others with four significant digits; digits in groups of three with
-/// narrow blanks: "12 345 678", "0.08324", "1.2e+30".
+/// Whole numbers in full and others with four significant digits; narrow blanks separate groups of
+/// three digits: "12 345 678", "0.08324", "1.2e+30".
 std::string shortNumber(double value);
 std::string shortNumber(std::int64_t value);
 
-/// The same with its unit, as catalogue/ names units. Sizes, times and electrical units get
-/// prefixes: "1.5 GiB", "12.5 ms", "3.2 days", "41.3 °C". Percentages are "12 %", counts have no
-/// unit, and other units stand behind the number.
+/// A number with its unit, as named in catalogue/. Sizes, times and electrical units get prefixes:
+/// "1.5 GiB", "12.5 ms", "3.2 days", "41.3 °C". Percentages are "12 %", counts have no unit, and
+/// any other unit follows the number.
 std::string figureText(double value, std::string_view unit);
 
 }  // namespace tavrel::page

@@ -26,7 +26,7 @@ void Table::row() {
   next_ = 0;
 }
 
-// Narrow pages show the column's title beside the cell.
+// On a narrow page, the column's title appears beside the cell.
 void Table::beginCell() {
   const Column& column = columns_.at(next_++);
   if (column.align == Align::Name) {

@@ -1,4 +1,4 @@
-// Tables that become a list of cards where the page is narrow.
+// Tables that turn into a list of cards on a narrow page.
 //
 //   Table table(html, "Drives", {{"Drive"}, {"Written", Table::Align::Number}});
 //   table.row();
@@ -20,8 +20,8 @@ namespace tavrel::page {
 
 class Table {
  public:
-  /// Names head their row; numbers stand flush right; plain texts speak for themselves and need no
-  /// title beside them on a card.
+  /// Names are row headings; numbers are right-aligned; plain texts are self-explanatory and need
+  /// no title beside them on a card.
   enum class Align : std::uint8_t { Text, Number, Name, Plain };
   struct Column {
     std::string title;
@@ -32,9 +32,9 @@ class Table {
   Table(HtmlWriter& html, std::string_view name, std::vector<Column> columns);
 
   void row();
-  /// The next cell of the row.
+  /// Writes the next cell of the row.
   void cell(std::string_view text);
-  /// A cell whose content `write` writes.
+  /// Writes a cell whose content `write` produces.
   void cell(const std::function<void(HtmlWriter& html)>& write);
   void end();
 
