@@ -1,4 +1,4 @@
-# Options that hold for every target.
+# Options for every target.
 add_library(tavrel_options INTERFACE)
 
 # Contraction is off so that every CPU gives the same bits for the same sum.
@@ -10,7 +10,7 @@ target_compile_options(tavrel_options INTERFACE
   -ffp-contract=off -fno-math-errno)
 
 # With optimisation, GCC 12 wrongly warns of overlapping and overlong copies inside std::string, and
-# of numbers used as pointers where a value is destroyed. The other builds have these warnings.
+# of numbers used as pointers where a value is destroyed. Other builds keep these warnings.
 if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
   foreach(warning restrict array-bounds stringop-overflow stringop-overread)
     target_compile_options(tavrel_options INTERFACE $<$<CONFIG:Release>:-Wno-${warning}>)
@@ -25,8 +25,8 @@ if(TAVREL_SANITIZE)
   target_link_options(tavrel_options INTERFACE -fsanitize=address,undefined)
 endif()
 
-# Tests are long functions that run once: to optimise them under the sanitizers takes longer than all
-# that it saves.
+# Tests are long functions that run once: under the sanitizers, optimising them
+# takes longer than it saves.
 add_library(tavrel_test_options INTERFACE)
 target_link_libraries(tavrel_test_options INTERFACE tavrel_options)
 target_compile_options(tavrel_test_options INTERFACE $<$<BOOL:${TAVREL_SANITIZE}>:-O0>)
@@ -37,9 +37,9 @@ if(TAVREL_FUZZ)
   target_link_options(tavrel_options INTERFACE -fsanitize=address,undefined)
 endif()
 
-# The flags with which distributions harden programs. The sanitizers have their own checks instead.
-# _FORTIFY_SOURCE works only in optimised builds; without a build type, a packager's flags set it.
-# Nobody replaces our functions, so that position-independent code may be inlined.
+# The flags with which distributions harden programs. Sanitizer builds have their own checks
+# instead. _FORTIFY_SOURCE works only in optimised builds; without a build type, a packager's flags
+# set it. Nobody interposes our functions, so position-independent code may be inlined.
 if(TAVREL_HARDENING AND NOT TAVREL_SANITIZE AND NOT TAVREL_FUZZ)
   set(CMAKE_POSITION_INDEPENDENT_CODE ON)
   include(CheckPIESupported)

@@ -1,11 +1,11 @@
-# Builds for another processor with Debian's cross compiler, against a folder with the libraries of
-# that processor, and runs what was built under QEMU. script/cross-test uses it.
+# Builds for another processor with Debian's cross compiler, against a folder with that processor's
+# libraries, and runs the result under QEMU. script/cross-test uses it.
 #   -DTAVREL_CROSS=s390x-linux-gnu -DTAVREL_CROSS_ROOT=FOLDER -DTAVREL_CROSS_EMULATOR=qemu-s390x-static
 set(CMAKE_SYSTEM_NAME Linux)
 set(CMAKE_TRY_COMPILE_PLATFORM_VARIABLES TAVREL_CROSS TAVREL_CROSS_ROOT TAVREL_CROSS_EMULATOR)
 set(CMAKE_C_COMPILER ${TAVREL_CROSS}-gcc)
 set(CMAKE_CXX_COMPILER ${TAVREL_CROSS}-g++)
-# GCC notes for each call by value that GCC 6 did it in another way.
+# For each call by value, GCC notes that GCC 6 passed it differently.
 set(CMAKE_CXX_FLAGS_INIT -Wno-psabi)
 set(CMAKE_SYSROOT ${TAVREL_CROSS_ROOT})
 set(CMAKE_LIBRARY_ARCHITECTURE ${TAVREL_CROSS})

@@ -1,9 +1,9 @@
-# Completions and manual pages that the built tools make of their own commands:
+# Completions and manual pages that the built tools generate from their own commands:
 #
 #   BUILD/completions/bash/PROGRAM, zsh/_PROGRAM, fish/PROGRAM.fish of tavrelctl and tavrel-fleet
 #   BUILD/man/PROGRAM.1 of both
 #
-# A cross build needs CMAKE_CROSSCOMPILING_EMULATOR to run the tools, and has none of them without.
+# A cross build needs CMAKE_CROSSCOMPILING_EMULATOR to run the tools; without it, it makes none.
 if(CMAKE_CROSSCOMPILING AND NOT CMAKE_CROSSCOMPILING_EMULATOR)
   message(WARNING "No completions and pages of tools: set CMAKE_CROSSCOMPILING_EMULATOR")
   return()
@@ -11,7 +11,7 @@ endif()
 
 set(tavrel_generated_documents)
 
-# What `PROGRAM completion ARGUMENTS` prints, in a file of the build folder.
+# Writes what `PROGRAM completion ARGUMENTS` prints to a file in the build folder.
 function(tavrel_generated_document file program)
   cmake_parse_arguments(ARG "" "" "ARGUMENTS;DEPENDS" ${ARGN})
   set(path ${PROJECT_BINARY_DIR}/${file})

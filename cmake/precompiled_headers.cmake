@@ -1,11 +1,11 @@
-# Headers that most sources need and that take long to compile are precompiled in release builds,
-# under the sanitizers and for fuzz targets alone, which nobody works with from day to day. Other
-# builds go without: there each source must include what it uses.
+# Precompiles headers that most sources need and that take long to compile, but only in the builds
+# that nobody works with from day to day: release, sanitizer and pure fuzzing builds. The other
+# builds go without, so that they show when a source lacks an include.
 #
 # tavrel_precompiled_headers(NAME HEADERS <header>... [LINK target...] [OPTIONS target])
 #
-# Makes a target that owns the headers, compiled with the options of OPTIONS (tavrel_options unless
-# named). Libraries and tests below the calling folder use them.
+# Makes a target that owns the headers, compiled with the options of the target OPTIONS (default:
+# tavrel_options). Libraries and tests below the calling folder use them.
 function(tavrel_precompiled_headers name)
   cmake_parse_arguments(ARG "" "OPTIONS" "HEADERS;LINK" ${ARGN})
   if(NOT CMAKE_BUILD_TYPE STREQUAL Release AND NOT TAVREL_SANITIZE

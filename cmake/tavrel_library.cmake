@@ -1,9 +1,9 @@
 # tavrel_library(NAME FOLDER [DEPENDS target...] [PRIVATE target...] [EXCLUDE file...])
 #
-# A library target of all sources in one folder. Headers are included by their path from the top
-# ("base/plist.h"), but each target offers only its own: they are linked into a folder of their own
-# under the build tree, so that an include of a folder that the target does not depend on does not
-# build.
+# A library target of all sources in one folder. Headers are included by their path from the
+# top ("base/plist.h"), but each target offers only its own: they are linked into a separate
+# folder in the build tree, so that including a header of a folder that the target does not
+# depend on fails to build.
 function(tavrel_library name folder)
   cmake_parse_arguments(ARG "" "" "DEPENDS;PRIVATE;EXCLUDE" ${ARGN})
 
