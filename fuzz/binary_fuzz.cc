@@ -1,5 +1,5 @@
-// Reads hostile binary property lists. What is read must survive the binary encoding unchanged;
-// XML cannot hold all of it, so there the second writing must give the bytes of the first.
+// Reads hostile binary property lists. Any value that is read must survive the binary encoding
+// unchanged. XML cannot represent all of it, so there a second writing must give the same bytes.
 #include <cstdint>
 #include <cstdlib>
 
@@ -19,7 +19,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   if (!value) return 0;
 
   const auto binary = plist::writeBinary(*value);
-  // What is shared is written once for each place that it is in, and may be too much then.
+  // A shared value is written once for each of its places, which may exceed the limits.
   if (!binary) return 0;
   const auto fromBinary = plist::readBinary(asBytes(*binary));
   if (!fromBinary || *fromBinary != *value) std::abort();

@@ -1,7 +1,7 @@
-// Boundaries of every kind and order, and values of any bits. The bucket found by halving is the
-// one at which a plain walk stops, and the histogram's labels keep the buckets apart.
+// Boundaries of every kind and order, and values with any bits. The binary search must find the
+// bucket where a plain walk stops, and the histogram's labels must keep the buckets apart.
 //
-// Input: the number of boundaries, 9 bytes for each (its kind, its bits), the values.
+// Input: the number of boundaries, 9 bytes for each (kind and bits), the values.
 #include <algorithm>
 #include <bit>
 #include <cstdint>
@@ -23,8 +23,8 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-/// Adds a boundary to the list, with the number as which it compares; a boundary that is not a
-/// number stops no value.
+/// Adds a boundary to the list, and the number that it compares as; a boundary that is
+/// not a number stops no value.
 void addBoundary(unsigned kind, std::uint64_t bits, plist::Array& list,
                  std::vector<double>& numbers) {
   constexpr double kNone = std::numeric_limits<double>::quiet_NaN();

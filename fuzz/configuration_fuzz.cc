@@ -1,8 +1,8 @@
-// Files of settings and memory, and addresses. They are refused in one line or read into what their
-// bounds allow, and what a program remembers reads back as it was written.
+// Files of settings and of memory, and URLs. Each is either refused with a one-line message or read
+// into values within their bounds, and what a program remembers reads back as it was written.
 //
-// Input: a byte that chooses the file; a byte, which when it is odd has the property list made of
-// what follows; the content.
+// Input: a byte that chooses the file; a byte that, when odd, means that the property list is built
+// from what follows; the content.
 #include <algorithm>
 #include <vector>
 

@@ -1,8 +1,8 @@
-// Counter blocks and manufacturer ids of any bytes: a parser depends on the words of its block
-// alone, and ids are read, whatever their characters, as a plain reading of their digits does.
+// Counter blocks and manufacturer ids of any bytes. A parser must depend only on its block's words,
+// and ids, whatever their characters, must read as a plain parser of digits reads them.
 //
 // Input: the length of the chip id (8 bits), the chip id, the length of the manufacturer id (8
-// bits), the manufacturer id, the block, which is filled up with zeros.
+// bits), the manufacturer id, the block, padded with zeros.
 #include <algorithm>
 #include <array>
 #include <cstdint>

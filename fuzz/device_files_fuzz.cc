@@ -1,9 +1,9 @@
-// Files that other users, packages and the kernel write: desktop entries, the lists of packages,
+// Files that other users, packages and the kernel write: desktop entries, package lists,
 // os-release, locales, counters of notifications, memory errors, the stat of a process whose name
-// anybody chooses. Names that come out are those of files and fields, events have their one size,
-// and a counter that was posted has grown.
+// may be anything. Resulting names are those of files and fields, events have their fixed size, and
+// a counter that was posted has grown.
 //
-// Input: a byte that chooses; then up to three contents, with 0xFF between them.
+// Input: a byte that chooses the reader, then up to three contents separated by 0xFF.
 #include <array>
 
 #include "memory_tree.h"
@@ -97,7 +97,7 @@ void readMemoryErrors(fuzz::Tree& tree, fuzz::Input& input) {
   tree.write("/var/lib/tavrel/ecc-events/y.errno", input.text());
   EccEvents events(tree.root, files, coding, log, EccEvents::Mode::Consume);
   std::array<std::byte, kEccEventBytes> buffer{};
-  // Each event, and then twice that none is left.
+  // Read all events; after the last one, "none left" must come twice.
   int ends = 0;
   for (int i = 0; i < 8 && ends < 3; ++i) {
     const auto result = events.next(buffer);
@@ -108,7 +108,7 @@ void readMemoryErrors(fuzz::Tree& tree, fuzz::Input& input) {
   require(ends >= 2);
 }
 
-// Whatever the name is, the number after it is the one that the kernel wrote.
+// Whatever the name is, the number after it must be the one that the kernel wrote.
 void readProcess(fuzz::Input& input) {
   const std::string whole(input.text());
   startInStat(whole);

@@ -1,10 +1,10 @@
-// A machine whose drives answer as they like: attributes in sysfs, log pages, registers and SMART
-// data. A reading says what it was read from or why there is none, labels are printable, and what
-// was written reads back.
+// A machine whose drives give arbitrary answers: attributes in sysfs, log pages, registers and
+// SMART data. A reading must say what it was read from or why there is none, labels must be
+// printable, and whatever was written must read back.
 //
-// Input: a byte that chooses SMART data alone or the machine, and drives that it lacks; then the
-// attributes of SMART data, or numbers of attributes with contents, 0xFF behind each, and the
-// drives' answer at the end.
+// Input: a byte that chooses SMART data alone or the machine, and which drives it lacks; then the
+// attributes of the SMART data, or numbers of attributes with their contents, each followed by
+// 0xFF, and finally the drives' answer.
 #include <dlfcn.h>
 #include <map>
 #include <optional>
@@ -65,7 +65,7 @@ class Answers final : public DeviceCommands {
   std::string answer_;
 };
 
-// In the form of libatasmart: the disk knows SMART, is well, and has these attributes.
+// In libatasmart's format: the disk supports SMART, is healthy, and has these attributes.
 std::string smartData(std::string_view attributes) {
   std::string blob;
   const auto add = [&](std::string_view tag, std::string part, std::size_t size) {
@@ -131,8 +131,8 @@ void readMachine(fuzz::Input& input, unsigned without) {
 
 }  // namespace
 
-// For libatasmart, which compiles the names of drives with quirks again for each drive that it
-// opens; that takes longer than all the rest.
+// For each drive that it opens, libatasmart compiles the names of drives with quirks again, which
+// would take longer than everything else. This keeps the compiled patterns.
 extern "C" int regcomp(regex_t* made, const char* pattern, int flags) {
   static std::map<std::pair<std::string, int>, regex_t> known;
   const auto [at, isNew] = known.try_emplace({pattern, flags});

@@ -1,5 +1,5 @@
-// Reads hostile logs. What the fast reader of XML takes, that of all of XML must read to the same
-// record; records must be in order, and read twice the same.
+// Reads hostile logs. What the fast XML reader accepts, the full reader must read into the same
+// record; records must be sorted, and reading twice must give the same record.
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
@@ -22,7 +22,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     if (!again || again->digest != record->digest) std::abort();
   } else if (record.error().message.empty() ||
              record.error().message.find('\n') != std::string::npos) {
-    // A reason may quote the log, whose line ends the program makes harmless when it prints them.
+    // A reason may quote the log, whose line ends the program escapes when it prints the reason.
     if (asText(bytes).find('\n') == std::string_view::npos) std::abort();
   }
 

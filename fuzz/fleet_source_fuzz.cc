@@ -1,6 +1,6 @@
-// What a fleet's server finds: archives, plain and compressed, lines about uploads, metadata beside
-// logs. Each log goes all the way to a record. Whatever arrives, each item says what became of it,
-// nothing is longer than the limits, and texts that go into tables are as short as others.
+// What a fleet's server finds: plain and compressed archives, lines about uploads, and metadata
+// beside logs. Each log goes all the way to a record. Whatever arrives, each item must say what
+// became of it, nothing may exceed the limits, and texts for tables must be as short as in any log.
 //
 // Input: a byte that chooses the form, then the bytes of the file.
 #include <algorithm>
@@ -68,7 +68,7 @@ void read(const fuzz::Tree& tree, const std::string& name, const UploadLines& li
 
 }  // namespace
 
-// Archives stay shallow unless the sums in the heads of their members are right.
+// Without correct checksums in their members' headers, archives would be refused at once.
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t most);
 extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
                                                std::size_t most, unsigned) {
@@ -108,7 +108,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       const auto useless = lines.read(tree.root.path("/lines"));
       const auto ends = static_cast<std::size_t>(std::ranges::count(text, '\n'));
       if (useless) require(*useless <= ends + 1);
-      // The log of which the examples speak.
+      // The log that the examples describe.
       if (const LogMetadata* const line = lines.find("device", "x.log")) checkTexts(*line);
       tree.write("/device/x.log", R"(<plist><dict/></plist>)");
       read(tree, "/device", lines);
@@ -120,7 +120,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       break;
     }
     default:
-      // A log, 0xFF, its metadata.
+      // a log, 0xFF, its metadata
       tree.write("/x.log", input.part());
       tree.write("/x.metadata.plist", input.text());
       read(tree, "/x.log", lines);

@@ -1,7 +1,7 @@
-// A foreign format with up to three arguments. Whatever it says, it is printed in proportion to its
-// arguments or refused without a trace; what C defines is printed as the C library prints it.
+// A format string from outside with up to three arguments. It must be printed in proportion to its
+// arguments or refused without output; what C defines must be printed as the C library prints it.
 //
-// Input: the number of arguments, 9 bytes for each (its type, its bits), the format.
+// Input: the number of arguments, 9 bytes for each (type and bits), the format.
 #include <array>
 #include <bit>
 #include <cmath>
@@ -32,7 +32,7 @@ Argument argumentOf(unsigned type, std::uint64_t bits, std::string& text) {
       return word;
     case 2: {
       const auto real = std::bit_cast<double>(bits);
-      return std::isnan(real) ? std::abs(real) : real;  // C may print a sign
+      return std::isnan(real) ? std::abs(real) : real;  // C may print the sign of a not-a-number
     }
     case 3:
       for (; bits % 256 != 0; bits /= 256)
@@ -45,7 +45,7 @@ Argument argumentOf(unsigned type, std::uint64_t bits, std::string& text) {
   }
 }
 
-// C leaves length modifiers of other conversions than integers, and zero bytes, undefined.
+// C leaves zero bytes, and length modifiers of conversions other than integers, undefined.
 bool isDefinedByC(std::string_view format) {
   if (format.find('\0') != std::string_view::npos) return false;
   while (true) {
@@ -62,7 +62,7 @@ bool isDefinedByC(std::string_view format) {
   }
 }
 
-// Turns the arguments one by one into those of a C call.
+// Expands the arguments, one by one, into those of a C call.
 template <class... Arguments>
 int printWithC(char* out, std::size_t size, const char* format,
                const std::vector<Argument>& arguments, Arguments... taken) {

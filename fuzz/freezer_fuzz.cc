@@ -1,8 +1,8 @@
-// The walk over a kernel snapshot beside a recursive one, which inputs of a few kB cannot make too
-// deep. Both must find the same thread and stop at the same item.
+// Compares the walk over a kernel snapshot with a recursive one, whose depth stays safe for inputs
+// of a few kB. Both must find the same thread and stop at the same item.
 //
-// Input: one byte; when it is even the items follow as they are, when it is odd each further byte
-// makes one item: three bits its type, two its identifier, three the length of its payload.
+// Input: one byte. If it is even, the items follow verbatim; if it is odd, each further byte makes
+// one item: three bits for its type, two for its identifier, three for its payload's length.
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
@@ -36,8 +36,8 @@ std::vector<std::byte> itemsFrom(ByteSpan codes) {
   return out;
 }
 
-// Offsets of the items as the recursion sees them. Where an item is not wholly there, every level
-// stops.
+// Offsets of the items as the recursion finds them. An
+// incomplete item stops every level.
 struct Reference {
   ByteSpan bytes;
 

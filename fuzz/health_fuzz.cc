@@ -1,7 +1,7 @@
-// Log pages, registers, texts of sysfs, readings and remembered counters. What is read and written
-// again reads back, and only counters grow beyond what was remembered.
+// Log pages, registers, texts from sysfs, readings and remembered counters. What was read and
+// written again must read back, and only counters may exceed what was remembered.
 //
-// Input: a byte that chooses, then the bytes.
+// Input: a byte that chooses the reader, then its bytes.
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/growth.h"
 #include "platform/linux/health/nvme_logs.h"

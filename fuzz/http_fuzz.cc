@@ -1,9 +1,9 @@
-// What servers answer, through all of libcurl: to the uploader, and, as rows, to the fleet's
-// questions; and the headers in which a log's metadata travels. Numbers from headers stay within
-// their bounds, and texts on one line. Rows are the same in whatever pieces they arrive. What a
-// header says of a log's versions, the fleet reads back.
+// Answers of servers, through all of libcurl: to the uploader and, as rows, to the fleet's
+// questions; and the headers that carry a log's metadata. Numbers from headers must stay within
+// their bounds, and texts on one line. Rows must not depend on the pieces in which they arrive. The
+// fleet must read back what a header says about a log's versions.
 //
-// Input: a byte that chooses, then the answer, the rows, or a property list.
+// Input: a byte that chooses the subject, then the answer, the rows, or a property list.
 #include <array>
 #include <cerrno>
 #include <map>
@@ -26,9 +26,9 @@ using fuzz::require;
 
 namespace {
 
-/// Answers each connection with the same bytes, and ends it. What libcurl takes for TCP is a pair
-/// of sockets, whose other end is here: the network of the kernel takes far longer than all the
-/// rest.
+/// Answers each connection with the same bytes and closes it. What libcurl takes for TCP
+/// is a pair of sockets whose other end is here: the kernel's network would take far
+/// longer than everything else.
 class AnsweringServer {
  public:
   void answerWith(std::string answer) {
@@ -70,7 +70,7 @@ void putLog(const std::string& answer) {
   }();
   upload::Connection connection(configuration);
   std::optional<Expected<upload::Answer>> got;
-  // An ordinary answer comes first: what is left of it must not matter.
+  // An ordinary answer comes first: nothing that it leaves behind may matter.
   for (const std::string& next :
        {std::string("HTTP/1.1 201 Created\r\nTavrel-Received: x\r\nContent-Length: 0\r\n\r\n"),
         answer}) {
@@ -96,7 +96,7 @@ fleet::ServerAddress addressOfServer() {
   return address;
 }
 
-// All rows, encoded again, and whether the answer ended within one.
+// All rows, encoded again, plus whether the answer ended in the middle of one.
 std::string rowsOf(fleet::Server& server, unsigned table, std::string answer) {
   theServer().answerWith(std::move(answer));
   fleet::ClickhouseReading reading(server);
@@ -177,7 +177,7 @@ void sendMetadata(ByteSpan document) {
 
 }  // namespace
 
-// For libcurl.
+// Replaces the C library's function for libcurl.
 extern "C" int socket(int domain, int type, int) noexcept {
   if (domain == AF_INET) return theServer().makeSocket(type);
   errno = EAFNOSUPPORT;

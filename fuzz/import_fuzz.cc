@@ -1,6 +1,6 @@
-// Import lines, cut into blocks at a place that the first byte chooses. However the stream is cut,
-// the same lines come out and the same line is refused; what was read and is written again reads
-// back the same, bit by bit.
+// Import lines, split into blocks at a position that the first byte chooses. Wherever the stream is
+// split, the same lines must come out and the same line must be refused; lines that are read and
+// written again must read back the same, bit by bit.
 #include <bit>
 #include <cstdint>
 #include <cstdlib>
@@ -22,7 +22,7 @@ std::string written(const ImportLine& line) {
   return text;
 }
 
-// All lines in the form of export, then the number of lines and the reason of the end.
+// All lines in export form, then the number of lines and the reason why reading ended.
 std::string readIn(std::string_view stream, std::size_t block) {
   std::string out;
   ImportParser parser(0);

@@ -1,5 +1,5 @@
-// Discovery of what a driver publishes as its legend, and of channels that it is asked for. What is
-// found can be counted, filed otherwise, selected and described.
+// Discovers what a driver publishes as its legend, and channels that it is asked for. Whatever is
+// found can be counted, regrouped, selected and described.
 //
 // Input: a byte of options, the legend.
 #include "reporting_values.h"

@@ -1,6 +1,6 @@
-// Arbitrary aggregates and a raw buffer: samples, their deltas, everything that channels are asked,
-// pruning and merging. Samples must have whole elements and leave the channels as they are, and a
-// delta of a sample with itself has no more channels than the sample.
+// Arbitrary aggregates and a raw buffer: samples, their deltas, all queries on channels, pruning
+// and merging. Samples must have whole elements and leave the channels unchanged, and the delta of
+// a sample with itself must not have more channels than the sample.
 //
 // Input: two aggregates, the buffer.
 #include "ioreport/elements.h"

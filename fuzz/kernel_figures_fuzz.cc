@@ -1,8 +1,8 @@
-// The kernel's texts that `stat collect` and the uploader read for themselves, and the reading that
-// one collection leaves for the next. Parts are no larger than their wholes, a route that is found
-// is one of the table, and a reading that was written reads back.
+// The kernel's texts that `stat collect` and the uploader parse, and the reading that one
+// collection leaves for the next. Parts must not exceed their wholes, a route that is found must be
+// in the table, and a reading that was written must read back.
 //
-// Input: a byte that chooses; then contents, with 0xFF between them.
+// Input: a byte that chooses the reader, then contents separated by 0xFF.
 #include "base/limits.h"
 #include "memory_tree.h"
 #include "support.h"
@@ -24,7 +24,7 @@ constexpr std::string_view kFiles[] = {"/proc/stat",
                                        "/sys/class/thermal/thermal_zone0/temp"};
 
 void collect(fuzz::Tree& tree, fuzz::Input& input, unsigned first) {
-  // Without these, the machine's own would be read.
+  // Without these files, the machine's own would be read.
   for (const std::string_view file : kFiles)
     tree.write(file, "");
   tree.write("/sys/block/sda/device/x", "");
@@ -32,7 +32,7 @@ void collect(fuzz::Tree& tree, fuzz::Input& input, unsigned first) {
     tree.write(kFiles[(first + i) % std::size(kFiles)], input.part());
   MachineSources sources(tree.root);
   const MachineReading reading = sources.read(Processes::Counted);
-  // The second reading uses the files that the first has opened.
+  // The second reading uses the files that the first has left open.
   const MachineReading again = sources.read(Processes::LeftOut);
   require(again.cpu.has_value() == reading.cpu.has_value() && again.cpus == reading.cpus);
   require(again.memoryTotalKib == reading.memoryTotalKib && !again.processes);

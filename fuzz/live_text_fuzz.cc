@@ -1,8 +1,8 @@
-// The kernel's texts behind report channels: names, numbers, tables and interrupts, through a tree
-// of files that holds nothing of earlier inputs. Each channel of a legend is known, and the values
-// of all fit into the room that was named for them; so they do once a file is empty.
+// The kernel's texts that report channels come from: names, numbers, tables and interrupts, in a
+// tree of files without traces of earlier inputs. Each channel of a legend must be known, and the
+// values of all channels must fit in the announced room, even after a file has become empty.
 //
-// Input: the number of a file and its content, followed by 0xFF; repeated.
+// Input: the number of a file, its content and 0xFF; repeated.
 #include <array>
 #include <utility>
 #include <vector>
@@ -20,11 +20,11 @@ using fuzz::require;
 
 struct File {
   const char* path;
-  const char* content;  // when the input does not say; without any the file is not there
-  bool isSlow = false;  // read by a thread of its own, as a device may keep the reader waiting
+  const char* content;  // used unless the input gives one; null means no file
+  bool isSlow = false;  // read by a separate thread, because a device may block the reader
 };
 constexpr LiveMachine::Options kPatient{10'000, 10'000};
-// New ones go to the end: inputs hold the numbers.
+// Append new files at the end, because inputs contain the numbers.
 constexpr File kFiles[] = {
     {"/proc/stat", ""},
     {"/proc/interrupts", ""},
@@ -59,7 +59,7 @@ constexpr File kFiles[] = {
     {"/sys/fs/cgroup/a.slice/memory.current", ""},
 };
 
-// The bytes of the largest channel and the number of all.
+// The size in bytes of the largest channel, and the number of channels.
 std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling& sampling) {
   std::size_t count = 0;
   std::size_t largest = kElementBytes;
@@ -99,7 +99,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     if (i == last || !contents[i].empty()) tree.write(kFiles[i].path, contents[i]);
   }
 
-  // The thread takes longer than all the rest: without patience there is none.
+  // The thread takes longer than everything else; without patience, none is started.
   fuzz::SilentLog log;
   LiveMachine machine(tree.root, log, isPatient ? kPatient : LiveMachine::Options{0, 0});
   const auto sampling = machine.subscribe();

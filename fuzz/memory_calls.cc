@@ -1,5 +1,5 @@
-// The C library's functions for files, in front of it: what concerns memory_files.h goes there, all
-// else to the kernel or to the library. Readers, libstdc++, libarchive and zlib all call these.
+// Interposes the C library's functions for files: calls that concern memory_files.h go there, all
+// others to the kernel or the library. Readers, libstdc++, libarchive and zlib all use these.
 #include <cerrno>
 #include <cstdarg>
 #include <cstdlib>
@@ -25,7 +25,7 @@ namespace {
 
 constexpr long kTmpfsMagic = 0x01021994;
 
-/// A folder that is being listed: its names as they were when it was opened.
+/// A folder being listed: its names at the time when it was opened.
 struct Listing {
   int descriptor;
   std::vector<std::pair<std::string, unsigned char>> entries;
@@ -52,7 +52,7 @@ bool isOurs(const char* path) {
   return path && path[0] == '/' && MemoryFiles::isPath(path);
 }
 
-// The path of `path` seen from a folder; nothing when it is not in memory.
+// Resolves `path` relative to a folder; nothing when it is not in memory.
 std::optional<std::string> pathAt(int folder, const char* path) {
   if (isOurs(path)) return path;
   if (!path || path[0] == '/' || !MemoryFiles::isDescriptor(folder)) return std::nullopt;
@@ -79,7 +79,7 @@ int openAt(int folder, const char* path, int flags, mode_t mode) {
   return static_cast<int>(syscall(SYS_openat, folder, path, flags, mode));
 }
 
-// What a call on a descriptor in memory answers; the kernel's answer for others.
+// Answers a call on a descriptor in memory; passes others on to the kernel.
 template <class Ours>
 auto onDescriptor(int descriptor, Ours ours, auto kernels) -> decltype(kernels()) {
   if (!MemoryFiles::isDescriptor(descriptor)) return kernels();
@@ -243,7 +243,7 @@ int fstat(int descriptor, struct stat* status) noexcept {
       [&] { return static_cast<int>(syscall(SYS_fstat, descriptor, status)); });
 }
 
-// SQLite maps the index of its log only, which nobody reads as a file.
+// SQLite maps only the index of its log, which nobody reads as a file.
 void* mmap(void* wanted, std::size_t size, int protection, int flags, int descriptor,
            off_t at) noexcept {
   if (!MemoryFiles::isDescriptor(descriptor)) {
@@ -383,7 +383,7 @@ int closedir(DIR* folder) {
   return outcome;
 }
 
-// The same functions under the names that programs for large files use.
+// The same functions under their names for large files.
 int open64(const char* path, int flags, ...) __attribute__((alias("open")));
 int openat64(int folder, const char* path, int flags, ...) __attribute__((alias("openat")));
 ssize_t pread64(int, void*, std::size_t, off_t) __attribute__((alias("pread")));

@@ -66,7 +66,7 @@ std::shared_ptr<MemoryNode> MemoryFiles::make(mode_t mode) {
   return node;
 }
 
-// "." and ".." do not occur in the paths of readers.
+// The paths that readers use contain no "." or "..".
 MemoryFiles::Place MemoryFiles::placeOf(std::string_view path) {
   path.remove_prefix(kMemoryRoot.size());
   MemoryNode* folder = root_.get();
@@ -129,7 +129,7 @@ void MemoryFiles::removeAll(std::string_view path) {
   const std::lock_guard lock(mutex);
   const Place place = placeOf(path);
   if (place.folder) place.folder->entries.erase(std::string(place.name));
-  // Nothing of one input may show in the next.
+  // Nothing of one input may be visible to the next.
   if (root_->entries.empty()) numbers_ = 1;
 }
 

@@ -1,9 +1,9 @@
-// Files in memory, for device roots: making and removing them costs microseconds, and no target
-// needs the disk.
+// Files in memory, for device roots: making and removing them takes only microseconds, so
+// no target needs the disk.
 //
-// memory_calls.cc leads the C library's functions for paths and descriptors here when the path is
-// below kMemoryRoot or the descriptor is one of these, so that readers run as they are. There are
-// folders and regular files, no links; nobody is refused for lack of rights, and locks are free.
+// memory_calls.cc redirects the C library's functions here for paths below kMemoryRoot and for
+// descriptors of these files, so that readers run unmodified. There are folders and regular files
+// but no links; access is never denied, and locks are always free.
 #pragma once
 
 #include <cstdint>
@@ -24,17 +24,17 @@ inline constexpr std::string_view kMemoryRoot = "/tavrel-memory";
 struct MemoryNode {
   mode_t mode = 0;
   ino_t number = 0;
-  long changes = 0;  // tells states of a file apart, as its time of change does
+  long changes = 0;  // distinguishes states of a file, as its ctime does
   std::string content;
   std::map<std::string, std::shared_ptr<MemoryNode>, std::less<>> entries;
-  std::map<std::size_t, std::shared_ptr<void>> mapped;  // by their place in the file
+  std::map<std::size_t, std::shared_ptr<void>> mapped;  // by their offsets in the file
 
   void setMode(mode_t bits) { mode = (mode & S_IFMT) | (bits & 07777); }
   bool isFolder() const { return S_ISDIR(mode); }
   struct stat status() const;
 };
 
-/// A descriptor, or a folder that is being listed.
+/// An open file, or a folder that is being listed.
 struct MemoryHandle {
   std::shared_ptr<MemoryNode> node;
   std::string path;
@@ -42,15 +42,15 @@ struct MemoryHandle {
   bool isAppending = false;
 };
 
-/// The functions that the C library has, without the path's root: -1 and `errno` on failure.
+/// The C library's functions for paths without the root; -1 and `errno` on failure.
 class MemoryFiles {
  public:
-  /// Of the process. SlowReads reads in threads.
+  /// The instance of this process. SlowReads uses it in threads.
   static MemoryFiles& all();
 
-  /// An empty folder of a name that no other has.
+  /// Makes an empty folder with a unique name.
   std::string makeRoot();
-  /// A file with its folders.
+  /// Makes a file, and the folders above it.
   void put(std::string_view path, std::string_view content);
   void removeAll(std::string_view path);
 
@@ -61,7 +61,7 @@ class MemoryFiles {
   ssize_t read(MemoryHandle& handle, void* room, std::size_t size, std::size_t at);
   ssize_t write(MemoryHandle& handle, const void* bytes, std::size_t size, std::size_t at);
   int truncate(MemoryHandle& handle, std::size_t size);
-  /// Memory that is shared by all who map this part, and lasts as long as the file.
+  /// Memory shared by everybody who maps this part; it lasts as long as the file.
   void* map(MemoryHandle& handle, std::size_t at, std::size_t size);
   bool isMapped(void* address) const { return mapped_.contains(address); }
   int makeFolder(std::string_view path, mode_t mode);
@@ -75,7 +75,7 @@ class MemoryFiles {
 
  private:
   struct Place {
-    MemoryNode* folder = nullptr;  // when it is there
+    MemoryNode* folder = nullptr;  // null when it does not exist
     std::string_view name;
   };
   Place placeOf(std::string_view path);

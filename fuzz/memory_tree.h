@@ -1,4 +1,4 @@
-// A device root of files in memory.
+// A device root whose files are in memory.
 #pragma once
 
 #include <string>
@@ -9,7 +9,7 @@
 
 namespace tavrel::fuzz {
 
-/// It is removed with the object, so that an input never sees what an earlier one has left.
+/// Destroyed with all its files, so that an input never sees what an earlier one left.
 class Tree {
  public:
   Tree() : root(MemoryFiles::all().makeRoot()) {}

@@ -1,4 +1,4 @@
-// Packets of the named service. The first byte chooses how the rest travels: as the packet itself,
+// Packets of the named service. The first byte chooses how the rest is sent: as the packet itself,
 // or in a memory file with some of the seals.
 #include <array>
 #include <cstdint>
@@ -24,7 +24,7 @@ void require(bool holds) {
   if (!holds) std::abort();
 }
 
-/// Both ends of one connection serve all inputs; what is left in it belongs to no later one.
+/// Both ends of one connection serve all inputs; nothing in it may be left for a later input.
 struct Connection {
   Connection() {
     std::array<int, 2> ends{};

@@ -1,6 +1,6 @@
-// A mutator for targets that read property lists: bytes that change at random seldom stay a
-// document, so that one value of the document is changed instead, or what a binary one says of
-// itself is mended afterwards.
+// A mutator for targets that read property lists. Bytes that change at random seldom leave
+// a valid document, so it changes one value of the document instead, or repairs the trailer
+// of a binary one afterwards.
 //
 //   extern "C" std::size_t LLVMFuzzerCustomMutator(...) { return mutatePropertyList(...); }
 #pragma once
@@ -18,7 +18,7 @@ extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, st
 
 namespace tavrel::fuzz {
 
-/// Changes one of a document's values, chosen by chance.
+/// Changes one randomly chosen value of a document.
 class ValueMutator {
  public:
   explicit ValueMutator(unsigned seed) : chance_(seed) {}
@@ -75,7 +75,7 @@ class ValueMutator {
     }
   }
 
-  // Of another kind now and then; null, which removes it, is among them.
+  // Returns another value, sometimes of another type; null, which removes the value, is among them.
   plist::Value another(const plist::Value& value) {
     switch (chance_() % 12) {
       case 0:
@@ -124,7 +124,7 @@ class ValueMutator {
   std::size_t left_ = 0;
 };
 
-/// The table of offsets goes where it is if the document's length is right.
+/// Points the trailer to the table of offsets, whose position follows from the document's length.
 inline void mendTrailer(std::uint8_t* data, std::size_t size) {
   constexpr std::size_t kHead = 8, kTrailer = 32;
   if (size < kHead + kTrailer || !std::equal(data, data + kHead, "bplist00")) return;

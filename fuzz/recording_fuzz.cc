@@ -1,8 +1,8 @@
 // Recordings of drivers, played as the registry does: services are named, searched and called, the
-// hub is subscribed to and sampled. A recording of what was shown shows the same again, and what a
-// connection hands out stays within its buffer.
+// hub is subscribed to and sampled. A recording of what was shown must show the same again, and
+// what a connection hands out must stay within its buffer.
 //
-// Input: a byte; when it is even, property lists with 0xFF between them (a binary one is alone),
+// Input: a byte. When it is even, property lists separated by 0xFF follow (or a single binary one);
 // when it is odd, values that look like recordings.
 #include <array>
 #include <vector>
@@ -81,7 +81,7 @@ std::vector<RecordingPart> partsOf(fuzz::Input& input) {
   return parts;
 }
 
-// Gives the elements of the hub's channels the ids and the count that they must have.
+// Corrects the ids and the count in the elements of the hub's channels.
 void mend(const plist::Dictionary& recording) {
   for (const plist::Value& value : recording.dictionary("Hub").array("Channels")) {
     plist::Dictionary channel = value.dictionary();
@@ -99,7 +99,7 @@ void mend(const plist::Dictionary& recording) {
   }
 }
 
-// What a caller can ask of a service, but for its properties.
+// Everything that a caller can ask of a service, except its properties.
 std::string ask(DriverService& service) {
   std::string said;
   std::uint64_t id = 0;

@@ -1,5 +1,5 @@
-// Property-list values out of fuzzer's bytes, inclined to look like aggregates, channels and
-// legends, and everything that can be asked of them.
+// Builds property-list values from the fuzzer's bytes, biased to look like aggregates, channels and
+// legends, and exercises everything that can be asked of them.
 #pragma once
 
 #include <span>
@@ -11,7 +11,7 @@
 
 namespace tavrel::fuzz {
 
-/// The keys of aggregates, of channels and of samples.
+/// The keys of aggregates, channels and samples.
 inline constexpr std::string_view kReportingKeys[] = {"QueryOpts",
                                                       "IOReportChannels",
                                                       "IOReportDrivers",
@@ -33,7 +33,7 @@ inline constexpr std::string_view kReportingKeys[] = {"QueryOpts",
                                                       "a",
                                                       "b"};
 
-/// Takes values off the front of the input, nulls at its end.
+/// Takes values off the front of the input; null once it is used up.
 class ValueReader {
  public:
   explicit ValueReader(ByteSpan input, std::span<const std::string_view> keys = kReportingKeys)
@@ -119,7 +119,7 @@ class ValueReader {
   std::span<const std::string_view> keys_;
 };
 
-/// Asks a channel everything.
+/// Asks a channel everything that the interface offers.
 inline void examine(const plist::Dictionary& channel) {
   std::int64_t unit = 0;
   const auto name = IOReportChannelGetChannelName(channel);

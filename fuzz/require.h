@@ -1,4 +1,4 @@
-// The one check of all targets: what does not hold is a finding.
+// The check that all targets use: a condition that does not hold is a finding.
 #pragma once
 
 #include <cstdlib>

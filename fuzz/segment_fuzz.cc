@@ -1,6 +1,6 @@
-// The parts of a segment that hold something, as the fuzzer likes them: the first bytes of the
-// header, the table of keys, the names, the cells and two chunks. The file is read twice: a second
-// read from where the first ended yields nothing, and what was yielded has a valid name.
+// The non-empty parts of a segment, filled with the input: the first bytes of the header, the table
+// of keys, the names, the cells and two chunks. The file is read twice: the second read, from where
+// the first ended, must yield nothing, and everything yielded must have a valid name.
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
@@ -18,7 +18,7 @@ using namespace tavrel;
 
 namespace {
 
-// Where the input goes, in its order, and how much of it.
+// Where the input goes, in order, and how many bytes.
 constexpr struct {
   std::uint64_t offset;
   std::size_t bytes;
@@ -53,7 +53,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   --size;
   std::vector<std::uint8_t> bytes(data, data + size);
   // A header that claims to use all cells and chunks takes a thousand times as long to read as one
-  // that uses those below: only inputs that ask for it keep such a claim.
+  // that uses only those below, so the claim is kept only when the options ask for it.
   if ((options & 4) == 0) {
     limit(bytes, kBHHeaderCellsUsed, 5);
     limit(bytes, kBHHeaderChunksUsed, 2);

@@ -1,5 +1,5 @@
-// Snapshot records through both renderers. Whatever the bytes say, a text is written whole, or cut
-// at the byte where its buffer ends, or its descriptor is refused and nothing is written.
+// Snapshot records through both renderers. Whatever the bytes say, a text must be written whole, or
+// cut where its buffer ends, or the descriptor is refused and nothing is written.
 //
 // Input: capacity and size of the descriptor (16 bits each), the descriptor, the records.
 #include <cstdint>
@@ -18,13 +18,13 @@ void expect(bool holds) {
   if (!holds) std::abort();
 }
 
-// Enough for what inputs of a few kB ask for; more is cut, which is as good.
+// Enough for inputs of a few kB; cutting a longer text tests just as much.
 constexpr std::size_t kRoom = 1U << 16;
 
 struct Rendered {
   int answer;
   std::size_t length;
-  std::vector<char> text;  // its size is the capacity, for the sanitizer
+  std::vector<char> text;  // of exactly `capacity` bytes, for the sanitizer
 };
 
 template <class Render>
@@ -66,7 +66,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const auto descriptorBytes = loadLittle16(input, 2);
   const auto part = descriptorBytes ? slice(input, 4, *descriptorBytes) : std::nullopt;
   if (!part) return 0;
-  // Buffers of their own, so that no read beyond their ends goes unseen.
+  // Separate buffers, so that the sanitizer sees every read beyond their ends.
   const std::vector<std::byte> descriptor(part->begin(), part->end());
   const ByteSpan behind = input.subspan(4 + part->size());
   const std::vector<std::byte> records(behind.begin(), behind.end());

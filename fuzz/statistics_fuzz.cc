@@ -1,5 +1,5 @@
-// Statistics buffers of any bytes: the parser takes in what a plain walk over the records finds,
-// the two lists stay in step, and the NAND information can be built from whatever they hold.
+// Statistics buffers of any bytes: the parser must find what a plain walk over the records finds,
+// both lists must stay in step, and the NAND information can be built from whatever they hold.
 #include <cstdint>
 #include <cstdlib>
 #include <cstring>
@@ -25,7 +25,7 @@ struct NoPreferences : Preferences {
   bool ZTXPreferencesSynchronize(std::string_view) override { return true; }
 };
 
-/// The values that a buffer must list, and whether it ends well.
+/// The values that the parser must list for a buffer, and whether the buffer ends properly.
 bool walk(ByteSpan buffer, std::vector<std::uint64_t>& values) {
   const std::uint64_t end = buffer.size() / 8 * 8;
   if (end == 0) return false;
@@ -57,7 +57,7 @@ void check(const ASPContext& context, const std::vector<std::uint64_t>& expected
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  // A copy of exactly that size, so that a read beyond the end shows.
+  // A copy of exactly this size, so that the sanitizer sees a read beyond its end.
   const auto copy = std::make_unique<std::byte[]>(size);
   if (size > 0) std::memcpy(copy.get(), data, size);
   const ByteSpan buffer(copy.get(), size);

@@ -1,4 +1,4 @@
-// Datagrams of StatsD lines, by way of their parser and of the recorder.
+// Datagrams of StatsD lines, passed through their parser and the recorder.
 #include <cmath>
 #include <cstdint>
 #include <cstdlib>

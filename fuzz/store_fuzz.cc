@@ -1,10 +1,10 @@
-// A store that is not as this program writes it: rows of any type and order, runs that lead
-// anywhere, damaged pages, damaged values that were kept beside it. Reading, adding, erasing and
-// examining end with the rows, or with a reason. Runs and kept values read back as they are
-// written.
+// A store unlike any that this program writes: rows of any type and order, runs that
+// lead anywhere, damaged pages, damaged values kept beside it. Reading, adding, erasing
+// and examining must end with the rows or with a reason. Runs and kept values must read
+// back as they were written.
 //
-// Input: a byte that chooses the store, runs or kept values, and whether SQLite examines the store;
-// then these.
+// Input: a byte that chooses between the store, runs and kept values, and whether SQLite examines
+// the store; then their content.
 #include <algorithm>
 #include <limits>
 #include <vector>
@@ -38,7 +38,7 @@ struct Device : fuzz::Tree {
   SqliteStore store{root, clock, preferences, log, 0};
 };
 
-// As SQL has it: an integer, a real number, a text or a blob.
+// An SQL literal: an integer, a real number, a text or a blob.
 std::string literal(fuzz::Input& input) {
   switch (const unsigned kind = input.byte(); kind % 8) {
     case 0:
@@ -58,7 +58,7 @@ std::string literal(fuzz::Input& input) {
   }
 }
 
-// Without STRICT, so that every column takes every type.
+// Makes tables without STRICT, so that every column takes every type.
 void makeRows(const std::string& path, fuzz::Input& input) {
   const bool isFirstVersion = input.byte() % 4 == 0;
   SqliteConnection made(path, SqliteConnection::Access::Create, std::make_shared<BusyBudget>(0));
@@ -88,7 +88,7 @@ void makeRows(const std::string& path, fuzz::Input& input) {
   made.execute("COMMIT");
 }
 
-// A sound store with some bytes of other values.
+// Makes a sound store and changes some of its bytes.
 void damage(Device& device, fuzz::Input& input) {
   static const std::string sound = [] {
     Device other;
@@ -112,7 +112,7 @@ void damage(Device& device, fuzz::Input& input) {
   device.write(kStorePath, bytes);
 }
 
-// What failed has a reason.
+// Every failure must have a reason.
 void tell(const auto& outcome) {
   require(outcome || !outcome.error().message.empty());
 }
@@ -120,7 +120,7 @@ void tell(const auto& outcome) {
 void read(SqliteHistory& history, bool isExamined) {
   const BHHistory::ScalarRowHandler takeScalar = [](std::string_view, std::int32_t, std::int64_t,
                                                     bool&) {};
-  // Once the values alone and once with their offsets.
+  // Reads once the values alone, and once with their offsets.
   const SqliteHistory::CountedRowHandler takeValues =
       [&](std::string_view, std::int32_t day, std::int64_t count,
           BHHistoryDistributionEnumerator& values, bool&) {
@@ -142,7 +142,7 @@ void read(SqliteHistory& history, bool isExamined) {
   tell(history.walkDistribution("a", kFirstDay, kLastDay, takeValues));
   tell(history.daysHeld());
   tell(history.bytesInUse());
-  // A thread bounds its time, which takes longer than all the rest.
+  // A thread limits the duration, which takes longer than everything else.
   if (isExamined) tell(history.examine(std::chrono::seconds(5)));
   const auto days = history.days();
   tell(days);
@@ -193,7 +193,7 @@ void readKept(Device& device, std::string content) {
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   Device device;
-  device.write(std::string(kStorePath) + "-other", "");  // so that there is the folder
+  device.write(std::string(kStorePath) + "-other", "");  // makes the folder
   const unsigned choice = input.byte();
   switch (choice % 4) {
     case 0:

@@ -1,4 +1,4 @@
-// What targets share: the bytes of the input, one part after another, and a log that nobody reads.
+// Code that targets share: reading the input part by part, and a log that nobody reads.
 #pragma once
 
 #include <algorithm>
@@ -27,21 +27,21 @@ class Input {
   Input(const std::uint8_t* data, std::size_t size)
       : rest_(reinterpret_cast<const char*>(data), size) {}
 
-  /// 0 at the end.
+  /// 0 at the end of the input.
   unsigned byte() { return static_cast<unsigned char>(upTo(1).append(1, '\0').front()); }
   std::string upTo(std::size_t most) {
     std::string taken(rest_.substr(0, most));
     rest_.remove_prefix(taken.size());
     return taken;
   }
-  /// Up to the next byte 0xFF, which texts do not have; that is taken, too.
+  /// Takes the bytes up to the next 0xFF, which texts do not contain, and drops the 0xFF.
   std::string part() {
     std::string taken = upTo(std::min(rest_.find('\xFF'), rest_.size()));
     upTo(1);
     return taken;
   }
   bool empty() const { return rest_.empty(); }
-  /// Little-endian; what the input lacks is 0.
+  /// A little-endian number; bytes that the input lacks are 0.
   std::uint64_t word(std::size_t bytes) {
     std::uint64_t taken = 0;
     for (std::size_t i = 0; i < bytes; ++i)

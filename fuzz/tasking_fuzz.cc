@@ -1,6 +1,6 @@
-// Tasking payloads of any content. One run applies what the payload says and nothing else, a second
-// changes nothing, and a run with another tasking takes the settings back and leaves the rest; each
-// domain is synchronised once, the daemon's own last.
+// Tasking payloads with any content. One run must apply what the payload says and nothing else, a
+// second run must change nothing, and a run with another tasking must revert the settings and leave
+// the rest. Each domain is synchronised once, the daemon's own last.
 #include <cstdlib>
 #include <map>
 #include <set>
@@ -29,7 +29,7 @@ void schedule(fakes::FakePlatform& fake, const plist::Dictionary& tasking) {
   fake.preferences.domain(kScheduleDomain).set(kScheduledTaskingKey, tasking);
 }
 
-/// The preferences outside the domains of the daemon and of whoever schedules.
+/// The preferences outside the domains of the daemon and of the scheduler of taskings.
 Domains others(const fakes::FakePlatform& fake) {
   Domains domains;
   for (const auto& [name, dictionary] : fake.preferences.domains) {
@@ -40,7 +40,7 @@ Domains others(const fakes::FakePlatform& fake) {
   return domains;
 }
 
-/// One run. Yields the domains that it synchronised.
+/// Performs one run. Returns the domains that it synchronised.
 std::set<std::string> track(fakes::FakePlatform& fake) {
   fake.journal.clear();
   trackOSChangeAndTasking(fake.platform);
@@ -99,12 +99,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   if (settings) touched.emplace(kTavrelDomain);
   require(track(fake) == touched);
   if (touchesState) {
-    track(fake);  // a tasking that sets the daemon's own state decides what comes next
+    track(fake);  // a tasking that sets the daemon's own state decides what follows
     return 0;
   }
   require(others(fake) == expected);
 
-  // Without settings nothing is remembered, and the tasking counts as new each time.
+  // Without settings nothing is remembered, so the tasking counts as new each time.
   require(track(fake).empty() && fake.journal.size() == (settings ? 0 : 1));
 
   schedule(fake, {{kTaskingIDKey, "two"}});

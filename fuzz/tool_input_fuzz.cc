@@ -1,8 +1,8 @@
-// What is given to tavrelctl: JSON, values on the command line, structured records, buffers of
-// statistics to build, logs to show. What JSON can hold reads back from it; a buffer
-// that was built parses; a record file gives the same lines whether it grows or was always whole.
+// Input to tavrelctl: JSON, values on the command line, structured records, statistics buffers to
+// build, logs to show. Whatever JSON can hold must read back from it, a buffer that was built must
+// parse, and a record file must give the same lines whether it grows or is complete from the start.
 //
-// Input: a byte that chooses, then the text.
+// Input: a byte that chooses the reader, then the text.
 #include <nlohmann/json.hpp>
 #include <sstream>
 
@@ -49,7 +49,7 @@ void readRecords(std::string_view text, std::size_t first) {
   fuzz::Tree tree;
   const std::string path = tree.root.path("/records");
   std::string lines[2];
-  // Once as a whole, once as it grows.
+  // Read it once as a whole, and once as it grows.
   tree.write("/records", text);
   RecordReader whole(path);
   require(static_cast<bool>(whole.read(true, [&](std::string_view line, std::uint64_t number) {

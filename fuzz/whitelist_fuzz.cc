@@ -1,5 +1,5 @@
-// A whitelist of any bytes: loading and checking it end well, and what the tool explains agrees
-// with what the daemon decides.
+// A whitelist of any bytes: loading and checking it must end properly, and what the tool explains
+// must agree with what the daemon decides.
 #include <cstdlib>
 #include <string>
 

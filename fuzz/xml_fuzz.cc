@@ -1,4 +1,4 @@
-// Reads hostile XML property lists. What is read must survive both encodings unchanged.
+// Reads hostile XML property lists. Any value that is read must survive both encodings unchanged.
 #include <cstdint>
 #include <cstdlib>
 
