@@ -1,6 +1,6 @@
-// Recording through libbrimhold next to the least that it could do, in one program: an atomic add
-// on a shared page, a look at the coarse clock and a comparison of days; for records also 16 bytes
-// stored. Both include what a page of memory costs, and leave out folding.
+// Recording through libbrimhold next to the minimum, in one program: an atomic add on a shared
+// page, a read of the coarse clock and a comparison of days; for records, also a store of 16 bytes.
+// Both include the cost of a page of memory and exclude folding.
 #include <atomic>
 #include <benchmark/benchmark.h>
 #include <cstdlib>
@@ -28,7 +28,7 @@ struct NoSink : SegmentSink {
   void takeRecord(const SegmentRecord&) override {}
 };
 
-/// A device in memory, and its fold.
+/// A device in memory, with its fold.
 class Device {
  public:
   Device() {
@@ -39,7 +39,7 @@ class Device {
   }
   ~Device() { std::filesystem::remove_all(root_); }
 
-  /// Aborts when values were dropped, because the figures would then measure something else.
+  /// Aborts when values were dropped, because the figures would then measure something different.
   void fold() {
     const std::scoped_lock lock(mutex_);
     for (const auto& entry : std::filesystem::directory_iterator(root_ / "run/tavrel/stat")) {
@@ -68,7 +68,7 @@ std::uint64_t coarseSeconds() {
   return static_cast<std::uint64_t>(now.tv_sec);
 }
 
-/// A shared mapping that is in memory, on a page boundary.
+/// A populated shared mapping on a page boundary.
 template <class T>
 T* sharedPages(std::size_t bytes) {
   void* memory = mmap(nullptr, bytes, PROT_READ | PROT_WRITE,
@@ -129,7 +129,7 @@ __attribute__((noinline)) void floorRecord(FloorLog* log, double value) {
   log->records[at].mark.store(now, std::memory_order_release);
 }
 
-// A log for each thread, as the library has.
+// One log per thread, as in the library.
 void recordFloor(benchmark::State& state) {
   FloorLog* const log = sharedPages<FloorLog>(sizeof(FloorLog));
   double value = 0;

@@ -1,11 +1,12 @@
 #!/usr/bin/env python3
-"""The same duty for four monitors at the same time; script/compare runs it.
+"""Runs four monitors with the same duty at the same time, for script/compare.
 
     bench/compare.py BIN_DIRECTORY PACKAGES SECONDS
 
-PACKAGES holds the unpacked packages; they are laid over /usr, /etc and /var in this process' mount
-namespace. CPU time is what the kernel gives for each process at its end, so its start counts; memory is the
-peak of what stays running, added up; what a program wrote is what reached the block device of its own file system.
+PACKAGES holds the unpacked packages; they are mounted over /usr, /etc and /var in this process's
+mount namespace. CPU time is the kernel's for each process at its end, so it includes its start;
+memory is the sum of the peaks of the processes that stay running; bytes written are those that
+reached the block device of the monitor's own file system.
 """
 
 import contextlib
@@ -28,7 +29,7 @@ NAMESPACE = "/var/lib/pcp/pmns"
 
 
 class Duty:
-    """The processes of one monitor, and the disk on which it keeps what it reads."""
+    """The processes of one monitor, and the disk on which it keeps its readings."""
 
     def __init__(self, name, disk):
         self.name = name
@@ -48,7 +49,7 @@ class Duty:
 
     def stop(self):
         for process in reversed(self.running):
-            # Not the peak that wait4 gives: it includes this program before the exec.
+            # Not the peak from wait4, which includes this program before the exec.
             status = pathlib.Path(f"/proc/{process.pid}/status").read_text(encoding="ascii")
             self.memory += int(re.search(r"VmHWM:\s+(\d+)", status)[1])
             process.send_signal(signal.SIGTERM)
@@ -58,7 +59,7 @@ class Duty:
         self.running = []
 
     def run(self, *command, environment=None):
-        """A program that ends by itself, counted as well."""
+        """Runs a program that ends by itself, and counts it as well."""
         self.start(*command, environment=environment)
         process = self.running.pop()
         _, status, usage = os.wait4(process.pid, 0)
@@ -139,14 +140,14 @@ def start_pcp(duty):
 
 
 def count_pcp(duty):
-    # A line of a record of results ends with its count; each is one metric with its instances.
+    # Each line of a result record that ends with a count is one metric with its instances.
     for line in text(["pmdumplog", duty.folder / "archive"]).splitlines():
         if re.match(r"\s+(inst \[.*\] value|60\.\S+ \(\S+\): .*\bvalue)", line):
             duty.values += 1
 
 
 def start_tavrel(duty, programs, seconds):
-    # Recording is in memory, below the device's root.
+    # Recording happens in memory, below the device's root.
     run = tempfile.mkdtemp(prefix="compare.", dir="/dev/shm")
     os.makedirs(f"{run}/tavrel/stat")
     os.symlink(run, duty.folder / "run")
@@ -155,15 +156,15 @@ def start_tavrel(duty, programs, seconds):
 
 
 def finish_tavrel(duty, programs):
-    """What else belongs to it: the hourly fold and the daily run."""
+    """Runs the rest of tavrel's duty: the hourly fold and the daily run."""
     environment = {"TAVREL_ROOT": str(duty.folder)}
     duty.run(programs / "tavrelctl", "stat", "fold", environment=environment)
     duty.run(programs / "tavrel", environment=environment)
 
 
 def count_tavrel(duty, programs):
-    """Each value of a distribution; a scalar for each sample, but for the processes, which are
-    counted once a minute."""
+    """Counts each value of a distribution, and a scalar for each sample, except for the processes,
+    which are counted once a minute."""
     statistics = json.loads(text([programs / "tavrelctl", "--root", duty.folder, "stat", "list",
                                   "com.norvane.usage.", "--json"]))
     scalars = {row["key"].rsplit(".usage.")[1]: row["value"] for row in statistics["scalars"]}

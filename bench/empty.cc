@@ -1,2 +1,2 @@
-// The floor of every process: what the system needs to start and end one.
+// The floor of every process: the cost for the system to start and end one.
 int main() {}

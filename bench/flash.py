@@ -1,5 +1,5 @@
-"""Counts what reaches a block device, including the file system's own blocks and journal, which the
-kernel's account of a process leaves out."""
+"""Counts bytes that reach a block device, including the file system's own blocks and journal, which
+the kernel's account of a process omits."""
 
 import os
 import shutil
@@ -15,8 +15,8 @@ def call(*command):
 
 
 class BlockDevice:
-    """An ext4 file system on a loop device, mounted while it is entered. Where the system does not
-    allow that, entering yields nothing, and `reason` says why."""
+    """An ext4 file system on a loop device, mounted on entry. Where the system does not allow that,
+    entering yields None, and `reason` says why."""
 
     def __enter__(self):
         self.folder = tempfile.mkdtemp(prefix="tavrel_flash.")
@@ -26,7 +26,7 @@ class BlockDevice:
             image = os.path.join(self.folder, "image")
             with open(image, "wb") as file:
                 file.truncate(IMAGE_BYTES)
-            # Writes everything now, so that none of it is written while a run is measured.
+            # Write everything now, so that nothing is left to write during a measurement.
             call("mkfs.ext4", "-q", "-F", "-E", "lazy_itable_init=0,lazy_journal_init=0", image)
             self.loop = call("losetup", "--find", "--show", image)
             os.mkdir(self.mounted)
@@ -45,7 +45,7 @@ class BlockDevice:
         shutil.rmtree(self.folder)
 
     def written(self):
-        """Bytes written since the device exists, after writing all that waits."""
+        """Bytes written since the device was made; first flushes everything pending."""
         descriptor = os.open(self.mounted, os.O_RDONLY)
         try:
             os.fsync(descriptor)

@@ -1,11 +1,11 @@
 #!/usr/bin/env python3
-"""Measures the fleet's tables: filing logs of 300 rows in SQLite beside plain inserts of the same
-rows, in ClickHouse beside clickhouse-client with the same rows from files, and reading them.
+"""Measures the fleet's tables: filing logs of 300 rows in SQLite next to plain inserts of the same
+rows, in ClickHouse next to clickhouse-client with the same rows from files, and reading them.
 
     bench/fleet_engine_runs.py BIN_DIRECTORY [LOGS]
 
-The CPU time of ClickHouse includes the server's. LOGS, 100,000 unless given, is the size of the
-large file.
+The CPU time of ClickHouse includes the server's. LOGS, 100,000 by default, is
+the size of the large file.
 """
 
 import os
@@ -33,7 +33,7 @@ USERS = """<yandex><profiles><default/></profiles><quotas><default/></quotas><us
 
 
 class Figure:
-    """Medians of what several runs took."""
+    """Medians over several runs."""
 
     def __init__(self):
         self.walls = []
@@ -57,7 +57,7 @@ class Program:
         self.path = os.path.join(binaries, "tavrel_fleet_rows")
 
     def __call__(self, *arguments):
-        """Count, wall seconds and CPU seconds of what the program did."""
+        """Returns the count, wall seconds and CPU seconds that the program prints."""
         output = subprocess.run([self.path, *map(str, arguments)], check=True, text=True,
                                 stdout=subprocess.PIPE).stdout.split()
         return int(output[1]), float(output[2]), float(output[3])
@@ -106,7 +106,7 @@ class Server:
         return (int(fields[11]) + int(fields[12])) / os.sysconf("SC_CLK_TCK")
 
     def save(self, database):
-        """The rows of a database as files, in the order of the logs."""
+        """Saves the rows of a database as files, ordered by log."""
         for table in TABLES:
             order = "name" if table == "key" else "log"
             with open(f"{self.folder}/{table}.rows", "wb") as file:
@@ -114,7 +114,7 @@ class Server:
                     f"SELECT * FROM {database}.{table} ORDER BY {order} FORMAT RowBinary"))
 
     def insert_saved(self, database):
-        """Lets clickhouse-client insert the saved rows: wall and CPU seconds."""
+        """Has clickhouse-client insert the saved rows. Returns wall and CPU seconds."""
         begin, before, server = time.monotonic(), os.times(), self.cpu()
         for table in TABLES:
             with open(f"{self.folder}/{table}.rows", "rb") as file:
@@ -161,7 +161,7 @@ def measure_clickhouse(program, wanted):
     append, client, scan = Figure(), Figure(), Figure()
     with tempfile.TemporaryDirectory() as folder, Server(folder) as server:
         for run in range(RUNS):
-            # Opening makes the tables, which is not measured.
+            # Opening makes the tables, so do that before the measurement.
             for database in (f"ours{run}", f"client{run}"):
                 program("append", server.address(database), 0)
             before = server.cpu()

@@ -1,12 +1,12 @@
 #!/usr/bin/env python3
 """Measures questions about many logs: the merged distribution of one statistic, on both engines
-beside the engine's own sum over the same column, asked over the same connection, and the comparison
-of two versions in 1,000 statistics.
+next to the engine's own sum over the same column and connection, and the comparison of two
+versions in 1,000 statistics.
 
     bench/fleet_question_runs.py BIN_DIRECTORY [LOGS]
 
-With 100,000 logs, unless LOGS says otherwise, the comparison takes a file of 3.3 GB, which should
-fit into memory. The CPU time of ClickHouse includes the server's.
+With 100,000 logs, the default of LOGS, the comparison takes a file of 3.3 GB, which should fit in
+memory. The CPU time of ClickHouse includes the server's.
 """
 
 import contextlib
@@ -29,10 +29,10 @@ RUNS = 7
 TIMES = 20
 KEY = "com.example.component.series_of_something.0"
 SUM = f"SELECT sum(mean) FROM distributions WHERE key = '{KEY}'"
-# Old servers apply the condition on a view's key late.
+# Old servers apply a condition on a view's key late, so query the table.
 SUM_ON_SERVER = f"SELECT sum(mean) FROM questions.distribution WHERE key = '{KEY}'"
 
-# Copies of a block of logs, much faster than filing as many.
+# Statements that copy a block of logs, which is much faster than filing that many.
 COPIES = (
     "INSERT INTO block SELECT id + :block, first_log + :logs FROM source.block",
     "INSERT INTO log SELECT id + :logs, randomblob(32), day, created, os_version, "
@@ -46,12 +46,12 @@ COPIES = (
 
 
 def medians(runs):
-    """Milliseconds of the clock and of the processors, of one of TIMES."""
+    """Milliseconds of wall and CPU time for one of TIMES operations."""
     return [statistics.median(column) / TIMES * 1e3 for column in zip(*runs)]
 
 
 def children():
-    """CPU seconds of the programs that have ended."""
+    """CPU seconds of all child programs that have ended."""
     used = resource.getrusage(resource.RUSAGE_CHILDREN)
     return used.ru_utime + used.ru_stime
 
@@ -112,7 +112,7 @@ def merge_in_clickhouse(binaries, program, logs, wanted):
 
 
 def copy_blocks(path, blocks):
-    """Copies the first block of logs, which is the only one, with other values."""
+    """Copies the only block of logs, with different values."""
     source = path + ".source"
     shutil.copy(path, source)
     with contextlib.closing(sqlite3.connect(path, isolation_level=None)) as tables:
@@ -130,7 +130,7 @@ def copy_blocks(path, blocks):
 
 
 def check_copies(program):
-    """Copied logs have the identifiers that loaded ones have."""
+    """Checks that copied logs have the same identifiers as loaded ones."""
     blocks = 3
     with tempfile.TemporaryDirectory() as folder:
         found = []

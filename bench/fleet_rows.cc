@@ -1,14 +1,14 @@
-// Fills and reads a fleet's database, and tells how long that took.
+// Fills and reads a fleet's database, and prints how long that took.
 //
 //   tavrel_fleet_rows append DATABASE LOGS [AT_ONCE [SCALARS DISTRIBUTIONS]]
-//                                                  files logs, of 300 rows unless told
+//                                                  files logs, of 300 rows by default
 //   tavrel_fleet_rows floor FILE LOGS [AT_ONCE]    inserts as many rows with plain SQLite
 //   tavrel_fleet_rows scan DATABASE [READERS]      reads all scalars and distributions
 //   tavrel_fleet_rows merge DATABASE TIMES         merges the logs of the first distribution
 //   tavrel_fleet_rows sum ADDRESS TIMES            lets ClickHouse add up their means
 //   tavrel_fleet_rows own ADDRESS TIMES            lets ClickHouse merge their five numbers
 //
-// Prints: what, logs or rows, seconds of the clock, seconds of the processors.
+// Prints: the operation, logs or rows, seconds of wall time, seconds of CPU time.
 #include <algorithm>
 #include <atomic>
 #include <chrono>
@@ -60,7 +60,7 @@ class Watch {
   double processorSeconds_ = 0;
 };
 
-// Logs with numbers that look drawn by lot and are always the same.
+// Logs whose numbers look random but are always the same.
 class Logs {
  public:
   explicit Logs(std::size_t scalars = kScalars, std::size_t distributions = kDistributions) {
@@ -129,7 +129,7 @@ void append(const char* where, std::size_t count, std::size_t atOnce, Logs logs)
   watch.print("append", added);
 }
 
-// The same rows in ascending order: a statement that is bound and run for each of them.
+// Inserts the same rows in ascending order, with a statement that is bound and run for each.
 void insertRows(const char* path, std::size_t count, std::size_t atOnce) {
   Watch watch;
   sqlite3* connection = nullptr;
@@ -234,7 +234,7 @@ std::string firstDistribution(Engine& engine) {
   return {};
 }
 
-// As `show` does it, after the table of logs was read. The same bits each time, or status 1.
+// Merges as `show` does, without reading the table of logs. All results must have equal bits.
 void merge(const char* where, std::size_t times) {
   Watch watch;
   const auto engine = openEngine(where, OpenMode::kRead);
@@ -255,8 +255,8 @@ void merge(const char* where, std::size_t times) {
   watch.print("merge", times);
 }
 
-// The least that a client of the same kind can ask about the same rows, and as much as `merge` does
-// in the server's own arithmetic.
+// The minimum that a similar client can ask about the same rows, and the equivalent of `merge` in
+// the server's own arithmetic.
 constexpr const char* kSum = "sum(mean)";
 constexpr const char* kOwnMerge =
     "min(minimum), max(maximum), sum(count) AS n, sum(mean * count) / n AS average, "

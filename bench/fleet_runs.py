@@ -1,11 +1,12 @@
 #!/usr/bin/env python3
-"""Times the loading of logs into SQLite by tavrel-fleet, beside Python's plistlib, which only reads
+"""Times the loading of logs into SQLite by tavrel-fleet next to Python's plistlib, which only reads
 the same files, in one process.
 
     bench/fleet_runs.py BIN_DIRECTORY [LOGS]
 
-Each log has 300 rows: 220 scalars, 30 distributions and 10 histograms of 5 buckets. A second load of ten times as many
-shows how the time of a log grows. The run fails unless each log is in the table.
+Each log has 300 rows: 220 scalars, 30 distributions and 10 histograms of 5 buckets. A second load
+of ten times as many logs shows how the time of a log grows. The run fails unless each log is in the
+table.
 """
 
 import datetime
@@ -43,7 +44,7 @@ def histogram(values):
 
 
 def log_text(numbers):
-    """A log in which MARK stands for the value that tells logs apart."""
+    """A log in which MARK stands for the value that distinguishes logs."""
     scalars = {f"com.example.usage.scalar.{key:04}": numbers.randrange(1000) * 10
                for key in range(220)}
     scalars[STARTS] = MARK
@@ -66,7 +67,7 @@ def log_text(numbers):
         "BHDistributionsHistogram": histograms, "BHTasking": [],
         "BHTaskID": "(no tasking id)", "BHTaskDigest": "(no tasking digest)",
         "BHWhitelistDigest": "4c322221a9e0e0eeb68ca791ecdcbaf8"})
-    # As devices write it: without a document type.
+    # Devices write no document type.
     lines = text.split(b"\n")
     return b"\n".join(line for line in lines if not line.startswith(b"<!DOCTYPE"))
 
@@ -87,7 +88,7 @@ def paths_below(folder):
 
 
 def load(program, folder, database, count):
-    """Wall and CPU seconds, the peak of memory in MiB."""
+    """Returns wall and CPU seconds, and the peak memory in MiB."""
     for ending in ("", "-wal", "-shm"):
         if os.path.exists(database + ending):
             os.remove(database + ending)
@@ -105,7 +106,7 @@ def load(program, folder, database, count):
 
 
 def read_with_python(paths):
-    """Wall and CPU seconds of one log. The files are in memory by now."""
+    """Returns wall and CPU seconds of one log. By then the files are in memory."""
     started, cpu = time.monotonic(), time.process_time()
     for path in paths:
         with open(path, "rb") as file:

@@ -1,4 +1,4 @@
-// The floor of a run: what its libraries need for the same data, in a process of its own.
+// The floor of a run: the cost of its libraries for the same data, in a separate process.
 //
 //   tavrel_floor [xml FILE] [md5 FILE] [scalars DATABASE DAY]
 #include <cstdint>

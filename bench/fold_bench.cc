@@ -1,5 +1,5 @@
-// A fold of real segments beside SQLite inserting the same packed values: a million measurements in
-// a thousand keys, which five processes recorded. Both write one transaction in a new file.
+// A fold of real segments next to SQLite inserting the same packed values: a million measurements
+// of a thousand keys, recorded by five processes. Both write one transaction into a new file.
 #include <benchmark/benchmark.h>
 #include <cstdlib>
 #include <filesystem>
@@ -26,7 +26,7 @@ std::string keyNumber(int number) {
   return "com.example.measurement." + std::to_string(number);
 }
 
-/// Segments and the store, both in memory, so that the disk is left out.
+/// Segments and the store, both in memory to exclude the disk.
 class Device {
  public:
   Device() {

@@ -1,4 +1,4 @@
-// Formatting beside the C library's printf, and dictionaries at several sizes.
+// Formatting next to the C library's printf, and dictionaries of several sizes.
 #include <array>
 #include <benchmark/benchmark.h>
 #include <cstdio>
@@ -11,7 +11,7 @@ namespace {
 
 using namespace tavrel;
 
-// Both append to a string that is kept, as the callers do.
+// Both append to a string that is reused, as the callers do.
 void messageByC(benchmark::State& state) {
   std::string out;
   for (auto _ : state) {

@@ -1,12 +1,12 @@
 #!/usr/bin/env python3
-"""Times a device with a long history beside one with a single day.
+"""Times a device with a long history next to one with a single day.
 
     bench/history_runs.py BIN_DIRECTORY
 
-The one holds 400 days of 10,000 scalars, half of them whitelisted, and 10,000 logs that wait; the
-other holds yesterday and no log. Both run in turn; printed are medians of CPU time (user and
-system). Then the limits are lowered to the defaults, and what that takes is printed. The exit status
-is 1 when a wanted figure (bench/wanted.py) is missed.
+The first holds 400 days of 10,000 scalars, half of them whitelisted, and 10,000 waiting logs; the
+other holds yesterday and no log. Both run in turn; the output is medians of CPU time (user and
+system). Then the limits are lowered to the defaults, and the time for that is printed. Exits with 1
+when a wanted figure (bench/wanted.py) is missed.
 """
 
 import os
@@ -30,7 +30,7 @@ def keys():
 
 
 def fill(device, days):
-    """Through a pipe: the lines of 400 days are too long for memory."""
+    """Uses a pipe, because the lines of 400 days do not fit in memory."""
     command = [os.path.join(device.bin, "tavrelctl"), "stat", "import", "-"]
     with subprocess.Popen(command, env=device.environment, stdin=subprocess.PIPE, text=True,
                           stdout=subprocess.DEVNULL) as process:
@@ -56,7 +56,7 @@ def file_logs(device):
 
 
 def medians(*commands):
-    """Milliseconds of CPU time of each command, a pair of arguments and device, run in turn."""
+    """Returns the median CPU milliseconds of each command (arguments and device), run in turn."""
     for arguments, device in commands:
         run_once(arguments, device.environment)
     times = [[run_once(arguments, device.environment)[0] for arguments, device in commands]

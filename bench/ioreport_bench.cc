@@ -1,5 +1,5 @@
-// The reporting client, per channel and at several numbers of channels: the time of one must not
-// grow with their number. Channels are filed by driver, a hundred each, in two groups.
+// The reporting client, per channel and for several numbers of channels: the time per channel must
+// not grow with their number. Each driver has a hundred channels, in two groups.
 #include <benchmark/benchmark.h>
 #include <malloc.h>
 #include <memory>
@@ -36,7 +36,7 @@ std::vector<std::byte> elementOf(std::uint64_t driver, std::uint64_t channel) {
   return bytes;
 }
 
-/// A recorded machine with a number of simple channels.
+/// A recorded machine with a given number of simple channels.
 struct Machine {
   explicit Machine(std::int64_t channels) {
     Array services = Array::create();
@@ -138,7 +138,7 @@ void subscription(benchmark::State& state) {
   countChannels(state);
 }
 
-// Flat, so that one array has them all.
+// Flat, so that a single array holds all channels.
 void sampling(benchmark::State& state) {
   Machine machine(state.range(0));
   const Dictionary channels = machine.channels(0);
@@ -172,7 +172,7 @@ void delta(benchmark::State& state) {
   countChannels(state);
 }
 
-// Each channel needs a search: the others are in reverse order, or missing.
+// Each channel needs a search, because the others are in reverse order or missing.
 void deltaOfOtherOrder(benchmark::State& state) {
   Machine machine(state.range(0));
   const Dictionary samples = IOReportCreateSamplesRaw(machine.channels(0), machine.buffer, nullptr);

@@ -1,6 +1,6 @@
-// Updates of live channels, beside a bare loop that opens, reads and closes the same files: a tree
-// in memory with the machine's own tables and a thousand files of one number, so that the kernel's
-// own cost of making figures is in neither.
+// Updates of live channels next to a bare loop that opens, reads and closes the same files: a tree
+// in memory with the machine's own tables and a thousand files of one number each, so that neither
+// includes the kernel's own cost of producing figures.
 #include <benchmark/benchmark.h>
 #include <cstdlib>
 #include <fcntl.h>

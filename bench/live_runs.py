@@ -1,5 +1,5 @@
 #!/usr/bin/env python3
-"""One sample of all live channels of this machine, beside node_exporter where it is installed.
+"""Takes one sample of all live channels of this machine, next to node_exporter if it is installed.
 
     bench/live_runs.py BIN_DIRECTORY
 """
@@ -21,12 +21,12 @@ ADDRESS = "127.0.0.1:9199"
 
 
 def values_of(report):
-    """The values of a sample: a table has one for each element."""
+    """How many values a sample has: a table has one per element."""
     return sum(channel.get("elements") or 1 for channel in json.loads(report)["channels"])
 
 
 def cpu_seconds(process):
-    """Of all threads of a process that runs."""
+    """CPU time of all threads of a running process."""
     folder = f"/proc/{process.pid}/task"
     nanoseconds = 0
     for thread in os.listdir(folder):
@@ -41,7 +41,7 @@ def scrape():
 
 
 def node_exporter():
-    """Microseconds of CPU for each value that node_exporter serves; None where it is missing."""
+    """Microseconds of CPU time per value that node_exporter serves; None if it is missing."""
     try:
         process = subprocess.Popen(["prometheus-node-exporter", f"--web.listen-address={ADDRESS}"],
                                    stdout=subprocess.DEVNULL, stderr=subprocess.DEVNULL)

@@ -1,15 +1,15 @@
 #!/usr/bin/env python3
-"""Counts what an unattended device writes to its flash on an ordinary day.
+"""Counts the bytes that an unattended device writes to its flash on an ordinary day.
 
     bench/ordinary_day.py BIN_DIRECTORY
 
 The device does what the installed timers do: it samples the machine each minute, folds each hour,
-reads the health of the drives four times, and once has the daily run, the tidying and the upload of
-the log. Its store is as large as its limit of days allows, so that each day removes one. Bytes are
-counted at a loop device, with the file system's own blocks and journal, after each step has been
-written back, as the kernel does by itself within half a minute; /run is a tmpfs. Where loop devices
-are not allowed, nothing is measured. The exit status is 1 when a wanted figure (bench/wanted.py) is
-missed.
+reads the health of the drives four times, and makes the daily run, the tidying and the upload of
+the log once. Its store is as large as its limit of days allows, so each day removes one. Bytes
+are counted at a loop device, including the file system's own blocks and journal, after each step
+has been written back, as the kernel does by itself within half a minute; /run is a tmpfs. Where
+loop devices are not allowed, nothing is measured. Exits with 1 when a wanted figure
+(bench/wanted.py) is missed.
 """
 
 import collections
@@ -26,7 +26,7 @@ from whole_runs import DAY, Device, STORE
 HOURS = 24
 SAMPLES_AN_HOUR = 60
 DAYS_HELD = 90
-DAYS = 2  # that are measured; at 64 folds of one date the store would begin to join values
+DAYS = 2  # measured days; at 64 folds of one date the store would begin to join values
 
 Step = collections.namedtuple("Step", "written cpu")
 
@@ -94,7 +94,7 @@ class OrdinaryDevice:
             file.write(plistlib.dumps({"Store": {"Days": days}}))
 
     def fill(self):
-        """Gives the store its past, and permits each key in the log."""
+        """Gives the store a history, and permits each key in the log."""
         self.sample()
         self.fold()
         scalars, distributions = self.recorded("scalars"), self.recorded("distributions")
@@ -110,7 +110,7 @@ class OrdinaryDevice:
         return len(scalars), len(distributions)
 
     def begin_day(self, days_held):
-        """As if the last daily run were a day ago."""
+        """Makes it look as if the last daily run was a day ago."""
         self.device.tool("prefs", "set", "com.norvane.tallied.tavrel",
                          "LastCrashLogSerializationDateInDaysSince1970", str(DAY - 1), "--int")
         self.hold(days_held)

@@ -1,12 +1,12 @@
 #!/usr/bin/env python3
-"""Times `tavrelctl page` over a year, and weighs the page.
+"""Times `tavrelctl page` over a year, and measures the size of the page.
 
     bench/page_runs.py BIN_DIRECTORY
 
-The one device has 365 days of 100 scalars and 20 distributions of 96 values, all of which are drawn;
-the other has 100 days of 3,000 scalars with long keys, of which most are not. Printed are medians
-of CPU time, the page's size and the ratio to reading the same values with `tavrelctl stat export`.
-The exit status is 1 when a wanted figure (bench/wanted.py) is missed.
+One device has 365 days of 100 scalars and 20 distributions of 96 values, all of them drawn; the
+other has 100 days of 3,000 scalars with long keys, most of which are left out. Prints medians of
+CPU time, the page's size and the ratio to reading the same values with `tavrelctl stat export`.
+Exits with 1 when a wanted figure (bench/wanted.py) is missed.
 """
 
 import os

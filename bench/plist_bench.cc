@@ -1,5 +1,5 @@
 // Property-list encodings at several sizes. Reading XML is shown next to a bare parse of the same
-// bytes: compare bytes_per_second of the two.
+// bytes, so that their bytes_per_second can be compared.
 #include <benchmark/benchmark.h>
 #include <expat.h>
 #include <string>
@@ -12,7 +12,7 @@ namespace {
 
 using namespace tavrel;
 
-// What a tallied log and a preference domain look like: keys with integers, and here and there a
+// Resembles a tallied log and a preference domain: keys with integers, and now and then a
 // small dictionary or array.
 plist::Value document(std::int64_t keys) {
   plist::Dictionary document;

@@ -3,7 +3,7 @@
 
     bench/recording_runs.py BIN_DIRECTORY
 
-Each is measured beside its floor in the same run, in turns. Times are CPU times.
+Each is measured in turn with its floor in the same run. Times are CPU times.
 """
 
 import array
@@ -20,13 +20,13 @@ import time
 
 from wanted import Wanted
 
-RUNS = 201  # of a short process
+RUNS = 201  # runs of a short process
 SAMPLES = 60
-ROUNDS = 15  # of each StatsD receiver
-DATAGRAMS = 4000  # per round: they fit into the buffer of a socket
+ROUNDS = 15  # per StatsD receiver
+DATAGRAMS = 4000  # per round: that many fit in a socket's buffer
 RECEIVE_BUFFER = 16 << 20
 SO_RCVBUFFORCE = 33
-LONGEST = 10  # seconds for anything that is waited for
+LONGEST = 10  # seconds to wait for anything
 
 
 class Device:
@@ -42,7 +42,7 @@ class Device:
         shutil.rmtree(self.root)
 
     def cpu(self, *command):
-        """Seconds that a process takes, whose output is dropped."""
+        """Returns the CPU seconds of a process, whose output is discarded."""
         actions = [(os.POSIX_SPAWN_OPEN, 1, os.devnull, os.O_WRONLY, 0),
                    (os.POSIX_SPAWN_OPEN, 2, os.devnull, os.O_WRONLY, 0)]
         process = os.posix_spawn(command[0], command, self.environment, file_actions=actions)
@@ -84,7 +84,7 @@ def samples(bin_directory, wanted):
 
 
 class Receiver:
-    """A program that receives from a UDP socket, stopped while nothing is measured."""
+    """A program that receives from a UDP socket, stopped whenever nothing is measured."""
 
     def __init__(self, device, *command):
         self.socket = socket.socket(socket.AF_INET, socket.SOCK_DGRAM)
@@ -108,7 +108,7 @@ class Receiver:
             return int(file.read().split()[0])
 
     def round(self, datagrams):
-        """CPU time per datagram, in nanoseconds."""
+        """Returns CPU time per datagram, in nanoseconds."""
         os.kill(self.process, signal.SIGSTOP)
         os.waitpid(self.process, os.WUNTRACED)
         for datagram in datagrams:
@@ -124,7 +124,7 @@ class Receiver:
         return (self.nanoseconds() - before) / len(datagrams)
 
     def lost(self):
-        """Datagrams that the kernel dropped for lack of room."""
+        """How many datagrams the kernel dropped for lack of room."""
         inode = os.fstat(self.socket.fileno()).st_ino
         with open("/proc/net/udp", encoding="ascii") as file:
             return next(int(line.split()[-1]) for line in file if f" {inode} " in line)

@@ -1,4 +1,4 @@
-// The report: summaries and histograms over packed values, whitelist look-ups, coarsening.
+// The report: summaries and histograms over packed values, whitelist look-ups, and coarsening.
 #include <benchmark/benchmark.h>
 #include <filesystem>
 #include <random>
@@ -28,7 +28,7 @@ std::vector<double> randomValues(std::size_t count) {
   return values;
 }
 
-/// A device in a folder of its own, with one distribution of many values in its store.
+/// A device in its own folder, with one distribution of many values in its store.
 struct Device {
   std::string root =
       (std::filesystem::temp_directory_path() / ("tavrel_bench." + std::to_string(getpid())))
@@ -45,7 +45,7 @@ struct Device {
   ~Device() { std::filesystem::remove_all(root); }
 };
 
-/// The bare loop that the summary is measured against: the same formula over an array.
+/// The baseline of the summary: a bare loop with the same formula over an array.
 void summaryBaseline(benchmark::State& state) {
   const std::vector<double> values = randomValues(kValues);
   for (auto _ : state) {
@@ -82,7 +82,7 @@ plist::Array ascending(std::int64_t count) {
   return boundaries;
 }
 
-/// From the store, with the given number of boundaries; none without a histogram.
+/// From the store, with the given number of boundaries; without a histogram when it is 0.
 void distributionFromStore(benchmark::State& state) {
   Device device;
   BHReport report(device.linuxPlatform.platform());

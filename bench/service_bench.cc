@@ -1,4 +1,4 @@
-// Messages through the named service, beside the same bytes through a bare socket pair.
+// Messages through the named service, next to the same bytes through a bare socket pair.
 #include <array>
 #include <benchmark/benchmark.h>
 #include <chrono>
@@ -17,7 +17,7 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kName = "com.norvane.tallied.tavrel";
-/// Messages in flight; they fit the kernel's default socket buffer.
+/// Messages in flight; this many fit in the kernel's default socket buffer.
 constexpr int kBatch = 50;
 
 struct SilentLog final : SystemLog {
@@ -105,7 +105,7 @@ void announcements(benchmark::State& state) {
 }
 BENCHMARK(announcements);
 
-/// A connection, one message and the closure: three events.
+/// A connection, one message and the close: three events.
 void connections(benchmark::State& state) {
   Service service;
   for (auto _ : state) {

@@ -1,12 +1,12 @@
 #!/usr/bin/env python3
-"""Times the service as a process of its own, with this one as its client.
+"""Times the service in a separate process, with this process as its client.
 
     bench/service_runs.py BIN_DIRECTORY
 
-Printed are its memory with nothing to do and with many peers, the CPU time of one message of a
-burst, and the time from the sending of a list of applications to the finished log, each beside what
-is wanted. Every message of the burst names an application of its own; the run fails unless the
-service's log tells of each exactly once, and of nothing dropped or refused.
+Prints its memory when idle and with many peers, the CPU time per message of a burst, and the time
+from sending a list of applications to the finished log, each next to the wanted figure. Every
+message of the burst names a different application; the run fails unless the service's log mentions
+each exactly once, and nothing that was dropped or refused.
 """
 
 import collections
@@ -34,7 +34,7 @@ APPLICATIONS = 5000
 DELIVERIES = 7
 SCALARS = 2000
 
-LONGEST = 60  # seconds for anything that is waited for
+LONGEST = 60  # seconds to wait for anything
 NAME = "com.norvane.tallied.tavrel"
 PENDING = "var/mobile/Library/Logs/Submission/pending"
 SEALS = fcntl.F_SEAL_SHRINK | fcntl.F_SEAL_GROW | fcntl.F_SEAL_WRITE
@@ -51,7 +51,7 @@ def message(**entries):
 
 
 class Service:
-    """The daemon serving below the device root, its log in a file."""
+    """The daemon serving below the device root, with its log in a file."""
 
     def __init__(self, device):
         self.log_path = device.path("service.log")
@@ -96,7 +96,7 @@ class Service:
         return len(os.listdir(f"/proc/{self.process.pid}/fd"))
 
     def cpu(self):
-        """Seconds, of all threads, user and system."""
+        """CPU seconds of all threads, user and system."""
         clock = ~self.process.pid << 3 | 2  # as clock_getcpuclockid makes it
         return time.clock_gettime(clock)
 
@@ -111,7 +111,7 @@ class Service:
 
 
 class NewLogs:
-    """Tells of logs in the pending folder at the moment in which they appear."""
+    """Reports logs in the pending folder as soon as they appear."""
 
     def __init__(self, folder):
         os.makedirs(folder, exist_ok=True)
@@ -124,7 +124,7 @@ class NewLogs:
         self.folder = folder
 
     def next(self):
-        """The path of the log, and when it appeared."""
+        """Returns the path of the next log, and when it appeared."""
         while select.select([self.file], [], [], LONGEST)[0]:
             now = time.monotonic()
             events = self.file.read(1 << 16)
@@ -144,7 +144,7 @@ def allow_descriptors(count):
 
 
 def check_burst(log, expected):
-    """Ends the run when a message was lost, or a peer dropped, refused or made to wait."""
+    """Ends the run when a message was lost, or a peer was dropped, refused or made to wait."""
     times = collections.Counter(re.findall(r'"bundle": "(burst\.\d+)"', log))
     if len(times) != expected or set(times.values()) != {1}:
         raise SystemExit(f"{expected - len(times)} of {expected} messages were lost, "
@@ -161,7 +161,7 @@ def burst(bin_directory, wanted):
                 for i in range(count)]
     device = Device(bin_directory)
     with Service(device) as service:
-        time.sleep(0.5)  # idle is what it is after a while without events
+        time.sleep(0.5)  # the memory when idle is that after a while without events
         idle = service.mebibytes("VmRSS")
         before = service.descriptors()
         peers = [service.connect() for _ in range(PEERS)]
@@ -202,7 +202,7 @@ def send_in_memory_file(connection, content):
 
 
 def deliver(bin_directory):
-    """Wall and CPU seconds from the sending of the applications to the log in the folder."""
+    """Returns wall and CPU seconds from sending the applications to the log in the folder."""
     device = Device(bin_directory)
     device.tool("stat", "import", "-", text="".join(scalar_lines(SCALARS)))
     device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(0, SCALARS, 2)])

@@ -1,4 +1,4 @@
-// The statistics buffer, parsed and made into the NAND information; the counters of a chip.
+// Parses the statistics buffer and builds the NAND information; reads a chip's counters.
 #include <benchmark/benchmark.h>
 #include <filesystem>
 #include <fstream>
@@ -29,7 +29,7 @@ void appendRecord(Bytes& out, std::uint32_t key, std::uint32_t count) {
     append(out, (key * 2654435761U + i) * 1000003ULL);
 }
 
-/// All statistics with all their values, and the version that has them.
+/// All statistics with all their values, in the version that has them.
 Bytes fullBuffer() {
   Bytes bytes;
   for (const StatisticKey& row : kStatisticKeys)
@@ -49,7 +49,7 @@ void parse(benchmark::State& state, const Bytes& bytes, std::int64_t values) {
   if (values > 0) state.SetItemsProcessed(state.iterations() * values);
 }
 
-/// Records that are skipped, of so many values each.
+/// Skipped records, each of the given number of values.
 void statisticsSkipped(benchmark::State& state) {
   Bytes bytes;
   while (bytes.size() < 1U << 20)
@@ -58,7 +58,7 @@ void statisticsSkipped(benchmark::State& state) {
 }
 BENCHMARK(statisticsSkipped)->Arg(0)->Arg(1)->Arg(16);
 
-/// A full buffer into a released context.
+/// Parses a full buffer into a released context.
 void statisticsParsed(benchmark::State& state) {
   std::int64_t values = 1;
   for (const StatisticKey& row : kStatisticKeys)
@@ -67,7 +67,7 @@ void statisticsParsed(benchmark::State& state) {
 }
 BENCHMARK(statisticsParsed);
 
-/// Many full buffers in one context.
+/// Parses many full buffers into one context.
 void statisticsAppended(benchmark::State& state) {
   Bytes bytes;
   for (std::int64_t i = 0; i < state.range(0); ++i) {
@@ -82,7 +82,7 @@ plist::Dictionary answerOf(std::uint8_t flags, const Bytes& output) {
   return {{"Method", 8}, {"Selector", 13}, {"Flags", flags}, {"Output", plist::Data(output)}};
 }
 
-/// The whole query of a recorded driver. The recording is loaded beforehand.
+/// The whole query of a recorded driver, excluding the loading of the recording.
 void nandInfo(benchmark::State& state) {
   const auto root =
       std::filesystem::temp_directory_path() / ("tavrel_storage_bench." + std::to_string(getpid()));
@@ -106,7 +106,7 @@ void nandInfo(benchmark::State& state) {
 }
 BENCHMARK(nandInfo)->Unit(benchmark::kMicrosecond);
 
-/// The building alone.
+/// Only the building.
 void nandInfoBuilt(benchmark::State& state) {
   LinuxPlatform device{DeviceRoot("/nonexistent")};
   ASPContext context;

@@ -1,5 +1,5 @@
-// Snapshot lines by the fixed layout and by a descriptor of the same one; the walk over a kernel
-// snapshot by size of its items and by depth of its containers.
+// Snapshot lines in the fixed layout and in the same layout given by a descriptor; the walk over a
+// kernel snapshot by size of its items and by depth of its containers.
 #include <benchmark/benchmark.h>
 #include <string>
 #include <vector>
@@ -91,7 +91,7 @@ void walk(benchmark::State& state, const Bytes& items) {
   state.SetBytesProcessed(state.iterations() * static_cast<std::int64_t>(items.size()));
 }
 
-// Items of a payload of that many bytes, all of them skipped.
+// Items with a payload of that many bytes, all of them skipped.
 void freezerPassedOver(benchmark::State& state) {
   Bytes items;
   appendItem(items, 0x13, 1, 4);

@@ -1,5 +1,5 @@
-// The statistics store: a day's rows and values through the history, beside SQLite itself reading
-// the same day from one row each, and the writing of a batch.
+// The statistics store: reading a day's rows and values through the history, next to SQLite itself
+// reading the same day from one row each, and writing a batch.
 #include <benchmark/benchmark.h>
 #include <cstdint>
 #include <filesystem>
@@ -45,7 +45,7 @@ class Device {
     if (!done || !(*batch)->commit()) abort();
   }
 
-  /// A plain table of the same rows, in a file of its own.
+  /// A plain table of the same rows, in a separate file.
   sqlite3* plainTable(std::int64_t rows) {
     sqlite3* handle = nullptr;
     sqlite3_open((folder_ + "/plain").c_str(), &handle);
@@ -142,7 +142,7 @@ BENCHMARK(appendValues)->RangeMultiplier(10)->Range(1000, 1'000'000)->Unit(bench
 
 /// A fold: many records for each of many keys, in one transaction.
 constexpr std::int64_t kFoldKeys = 1000;
-constexpr std::int64_t kFoldRecords = 1000;  // for each
+constexpr std::int64_t kFoldRecords = 1000;  // per key
 
 void fold(benchmark::State& state) {
   std::vector<DistributionSample> samples;
@@ -167,7 +167,7 @@ void fold(benchmark::State& state) {
 }
 BENCHMARK(fold)->Unit(benchmark::kMillisecond);
 
-/// SQLite alone with the same chunks, which are packed already.
+/// SQLite alone with the same chunks, already packed.
 void foldBySqlite(benchmark::State& state) {
   const std::string values(kFoldRecords * 8, 'v');
   const std::string offsets(kFoldRecords * 4, 'o');

@@ -1,12 +1,12 @@
 #!/usr/bin/env python3
-"""Counts what changes of the statistics store write to a block device.
+"""Counts the bytes that changes of the statistics store write to a block device.
 
     bench/store_runs.py BIN_DIRECTORY
 
-Counted on a device whose store holds two weeks of seven values a second: one call of tavrelctl
-alone, several one after the other, and days that are folded into the store every hour. Bytes are
-counted at a loop device, with the file system's own blocks and journal; where loop devices are not
-allowed, nothing is measured. The exit status is 1 when a wanted figure (bench/wanted.py) is missed.
+The device's store holds two weeks of seven values a second. Counted are a single call of tavrelctl,
+several calls in a row, and days that are folded into the store every hour. Bytes are counted at a
+loop device, including the file system's own blocks and journal; where loop devices are not allowed,
+nothing is measured. Exits with 1 when a wanted figure (bench/wanted.py) is missed.
 """
 
 import random
@@ -21,7 +21,7 @@ RECORD_BYTES = 12  # a value and its offset
 
 
 def value_lines(day, keys, values, second):
-    """So many values for each key, one a second."""
+    """`values` values for each of `keys` keys, one a second."""
     generator = random.Random(second)
     return "".join(
         f"value\t{day}\tcom.example.{key:04}\t{second + i}\t{generator.gauss(0, 9):.17g}\n"
@@ -42,7 +42,7 @@ class Flash:
         self.device.tool("stat", "import", "-", text=value_lines(*arguments))
 
     def day(self, keys, values):
-        """Bytes of a day of hourly folds, each of so many values for each key."""
+        """Bytes of a day of hourly folds, each with `values` values per key."""
         return sum(self.written(lambda: self.take(DAY, keys, values, hour * 3600))
                    for hour in range(HOURS))
 

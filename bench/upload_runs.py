@@ -1,10 +1,10 @@
 #!/usr/bin/env python3
 """Times the upload of waiting logs to nginx on this machine, over TLS with a client certificate, in
-turn with curl, which sends the same files as they are over one connection.
+turn with curl, which sends the same files unchanged over one connection.
 
     bench/upload_runs.py BIN_DIRECTORY
 
-The server is set up as docs/examples/upload/nginx.conf says. The run fails unless each log arrives.
+The server follows docs/examples/upload/nginx.conf. The run fails unless each log arrives.
 """
 
 import gzip
@@ -26,7 +26,7 @@ RUNS = 5
 KEYS = 200
 EXAMPLE = os.path.join(os.path.dirname(__file__), "../docs/examples/upload/nginx.conf")
 SUBMISSION = "var/mobile/Library/Logs/Submission"
-LONGEST = 60  # seconds for anything that is waited for
+LONGEST = 60  # seconds to wait for anything
 
 
 def call(*command):
@@ -34,7 +34,7 @@ def call(*command):
 
 
 class Server:
-    """Debian's nginx, its files below `folder`."""
+    """Debian's nginx, with its files below `folder`."""
 
     def __init__(self, folder):
         self.folder = folder
@@ -81,7 +81,7 @@ class Server:
         return f"https://127.0.0.1:{self.port}/logs"
 
     def take_logs(self):
-        """The logs that have arrived, by name; they are removed."""
+        """Returns the logs that have arrived, by name, and removes them."""
         folder = self.path("srv/device")
         logs = {}
         for name in os.listdir(folder):
@@ -120,7 +120,7 @@ def fill(device, logs):
 
 
 def permit_upload(device, server):
-    """Has the device send its logs to the server, and yields the environment of tavrel-upload."""
+    """Makes the device send its logs to the server; returns the environment of tavrel-upload."""
     os.makedirs(device.path("etc/tavrel"))
     with open(device.path("etc/tavrel/upload.plist"), "wb") as file:
         file.write(plistlib.dumps({"URL": server.url()}))
@@ -133,10 +133,10 @@ def permit_upload(device, server):
 
 
 def timed(command, device, environment):
-    """Wall and CPU seconds, and the peak of memory in MiB."""
+    """Returns wall and CPU seconds, and the peak memory in MiB."""
     peak = device.path("peak")
     started = time.monotonic()
-    # The peak that wait4 knows begins with this process's own.
+    # The peak from wait4 would include this process's own.
     process = subprocess.Popen(["/usr/bin/time", "-f", "%M", "-o", peak, *command],
                                env=environment, stdout=subprocess.DEVNULL,
                                stderr=subprocess.DEVNULL)

@@ -1,12 +1,12 @@
-"""The limits of the measured figures, and a list of the figures that missed theirs.
+"""Limits for the measured figures, and the list of figures that missed theirs.
 
     wanted = Wanted()
     print(f"  memory  {mebibytes:.2f} MiB{wanted.judge('service: memory when idle, MiB', mebibytes)}")
     sys.exit(wanted.status())
 """
 
-# The most that each figure may be. Times are CPU times unless the name says otherwise; ratios are
-# to what is measured in the same run. Milliseconds of CPU time are for a machine on which the
+# The maximum of each figure. Times are CPU times unless the name says otherwise; ratios refer to
+# something measured in the same run. Milliseconds of CPU time are for a machine on which the
 # libraries take REFERENCE_MS for the day of 2,000 scalars; `calibrate` scales them for this one.
 REFERENCE_MS = 2.5
 LIMITS = {
@@ -21,9 +21,9 @@ LIMITS = {
     "ordinary day: CPU, s": 5.0,
     "service: memory when idle, MiB": 8.0,
     "stat add: ratio to an empty program": 2.0,
-    # 20 values at 66,200 in a second of CPU time.
+    # 20 values per sample at 66,200 values per second of CPU time
     "stat collect: one sample, us": 302.0,
-    # 0.7 of the loop's datagrams per second.
+    # 0.7 times the loop's datagrams per second
     "statsd: CPU of one datagram, ratio to a bare loop": 1.43,
     "statsd: memory, MiB": 8.0,
     "service: delivery to log, wall ms": 50.0,
@@ -37,11 +37,11 @@ LIMITS = {
     "fleet: merge in SQLite, ratio to its sum": 3.0,
     "fleet: merge in ClickHouse, ratio to its sum": 3.0,
     "fleet: merge in ClickHouse, ratio to its own merge": 3.0,
-    # 1,000 statistics over 100,000 logs in 10 s.
+    # 1,000 statistics over 100,000 logs in 10 s
     "fleet compare: wall of a million rows, s": 0.1,
-    # 5,000 logs a second on two processors.
+    # 5,000 logs a second on two processors
     "fleet load: CPU of one log, us": 400.0,
-    # Ten times the rate of plistlib, which only reads.
+    # ten times the rate of plistlib, which only reads
     "fleet load: wall time of a log, ratio to plistlib": 0.1,
     "fleet load: CPU of a log among ten times as many, ratio": 1.2,
     "long history: tavrel -f, ratio to one day": 2.0,
@@ -58,11 +58,11 @@ class Wanted:
         self.slowness = 1.0
 
     def calibrate(self, libraries_ms):
-        """Takes what the libraries need on this machine, measured beside the figures."""
+        """Sets the libraries' time on this machine, measured together with the figures."""
         self.slowness = libraries_ms / REFERENCE_MS
 
     def judge(self, name, figure):
-        """The text to print after a figure."""
+        """Returns the text to print after a figure."""
         limit = LIMITS[name]
         if name.endswith(", ms"):
             limit = round(limit * self.slowness, 1)
@@ -72,7 +72,7 @@ class Wanted:
         return f"   MISSED, wanted <= {limit:g}"
 
     def status(self):
-        """Prints the missed figures, and yields the exit status of the program."""
+        """Prints the missed figures, and returns the exit status of the program."""
         for line in self.missed:
             print(f"missed: {line}")
         return 1 if self.missed else 0

@@ -3,11 +3,11 @@
 
     bench/whole_day.py BIN_DIRECTORY
 
-Printed are the CPU time (median of several days, each on a new device), the peak memory, the bytes
-written beside the bytes of content, and the number of flushes (with strace, where it is installed).
-Bytes are counted at a block device where loop devices are allowed; elsewhere the kernel's account
-of the process stands in. Then each number of the day grows alone, so that the cost of one more can
-be seen.
+Prints the CPU time (median of several days, each on a new device), the peak memory, the bytes
+written next to the bytes of content, and the number of flushes (if strace is installed).
+Bytes are counted at a block device where loop devices are allowed, and otherwise taken from
+the kernel's account of the process. Then each number of the day is increased separately, to
+show the cost of one more.
 """
 
 import collections
@@ -34,8 +34,8 @@ Day = collections.namedtuple(
 BUSY = Day(scalars=2000, distributions=200, values=5000, channels=500, telemetry=8, defects=1000,
            ecc_events=10)
 
-STATISTICS, BAND_STATISTICS, DEFECTS, TELEMETRY = 13, 11, 15, 17  # selectors of the driver
-SIZE_QUERY = 1  # flag of a request
+STATISTICS, BAND_STATISTICS, DEFECTS, TELEMETRY = 13, 11, 15, 17  # the driver's selectors
+SIZE_QUERY = 1  # a flag of a request
 ASP_METHOD = 8
 
 
@@ -53,7 +53,7 @@ def validity_list():
 
 
 def driver(day, generator):
-    """A storage driver: what each of its lists answers to a query of the size and to a fetch."""
+    """A storage driver: the answer of each of its lists to a query of the size and to a fetch."""
     with open(os.path.join(EXAMPLES, "nand/statistics.bin"), "rb") as file:
         lists = {(STATISTICS, 0): file.read(), (BAND_STATISTICS, 0): validity_list(),
                  (DEFECTS, 0): defects_list(day.defects, generator)}
@@ -91,7 +91,7 @@ def write(path, content):
 
 
 def make_store(bin_directory, scalars, distributions, values):
-    """A device that has statistics, all of them whitelisted, and nothing else."""
+    """A device that has only statistics, all of them whitelisted."""
     device = Device(bin_directory)
     device.tool("stat", "import", "-", text="".join(
         scalar_lines(scalars) + value_lines(distributions, values)))
@@ -105,7 +105,7 @@ def make_store(bin_directory, scalars, distributions, values):
 
 
 class Devices:
-    """Makes devices. Importing takes the longest by far, so each store is made once and copied."""
+    """Makes devices. Importing is by far the slowest step, so stores are made once and copied."""
 
     def __init__(self, bin_directory):
         self.bin_directory = bin_directory
@@ -133,11 +133,11 @@ class Devices:
 
 
 def run(device, prefix=()):
-    """CPU seconds and the kernel's account of written bytes."""
+    """Returns CPU seconds, and the bytes written according to the kernel's account."""
     with open(os.devnull, "r+b") as null:
         process = subprocess.Popen([*prefix, *device.daemon("-d")], env=device.environment,
                                    stdin=null, stdout=null, stderr=null)
-    # The account can be read until the process is reaped.
+    # The account is readable until the process is reaped.
     os.waitid(os.P_PID, process.pid, os.WEXITED | os.WNOWAIT)
     with open(f"/proc/{process.pid}/io", encoding="ascii") as file:
         account = dict(line.split(": ") for line in file)
@@ -158,7 +158,7 @@ def files_of(device):
 
 
 def content_bytes(before, after):
-    """Bytes of files that are new or have grown, other than the store's own."""
+    """Bytes in files that are new or have grown, except the store's own."""
     total = 0
     for path, status in after.items():
         if STORE in path:
@@ -170,7 +170,7 @@ def content_bytes(before, after):
 
 
 def scalar_rows(device, since):
-    """Rows and bytes of content that the run added to the store."""
+    """Rows, and bytes of their content, that the run added to the store."""
     query = f"SELECT count(*), coalesce(sum(length(key) + 16), 0) FROM scalars WHERE day > {since}"
     output = subprocess.run(["sqlite3", device.path(STORE), query], check=True, text=True,
                             capture_output=True).stdout

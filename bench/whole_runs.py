@@ -1,13 +1,13 @@
 #!/usr/bin/env python3
-"""Times whole processes, each in turn with its floor: what the libraries alone need for the data, or
-an empty program.
+"""Times whole processes, each in turn with its floor: the cost of the libraries alone for the same
+data, or an empty program.
 
     bench/whole_runs.py BIN_DIRECTORY
 
-Each command runs several times; printed are the median CPU time (user and system) with the middle
-half of the runs, the peak memory and the ratio to the floor. Times of the machine's other work do
-not count. Instructions are counted with valgrind, where it is installed. The exit status is 1 when
-a wanted figure (bench/wanted.py) is missed.
+Each command runs several times. Prints the median CPU time (user and system) with the quartiles of
+the runs, the peak memory and the ratio to the floor. Other work of the machine does not count.
+Instructions are counted with valgrind if it is installed. Exits with 1 when a wanted figure
+(bench/wanted.py) is missed.
 """
 
 import copy
@@ -42,7 +42,7 @@ class Device:
                   "--bool")
 
     def copy(self, folder=None):
-        """Another device with the same content, below a folder of the caller's choice."""
+        """Makes another device with the same content, below a folder that the caller chooses."""
         twin = copy.copy(self)
         twin.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.", dir=folder)
         twin.environment = {**self.environment, "TAVREL_ROOT": twin.root}
@@ -71,7 +71,7 @@ class Device:
 
 
 def run_once(command, environment):
-    """CPU and wall seconds of one run whose output is thrown away."""
+    """Returns CPU and wall seconds of one run, whose output is discarded."""
     with open(os.devnull, "r+b") as null:
         started = time.monotonic()
         process = subprocess.Popen(command, env=environment, stdin=null, stdout=null, stderr=null)
@@ -84,7 +84,7 @@ def run_once(command, environment):
 
 
 def peak_mebibytes(command, environment):
-    """Of one run. GNU time starts it, since a process counts the memory of the one it came from."""
+    """For one run. GNU time starts it, because a process's peak includes that of its parent."""
     with tempfile.NamedTemporaryFile("r") as file:
         subprocess.run(["/usr/bin/time", "-f", "%M", "-o", file.name, *command], env=environment,
                        check=True, stdin=subprocess.DEVNULL, stdout=subprocess.DEVNULL,
@@ -93,13 +93,13 @@ def peak_mebibytes(command, environment):
 
 
 def summary(times):
-    """Median and quartiles in milliseconds."""
+    """Returns the median, and a text with the quartiles, in milliseconds."""
     low, median, high = (value * 1e3 for value in statistics.quantiles(times, n=4))
     return median, f"{median:8.2f} ms CPU ({low:.2f} to {high:.2f})"
 
 
 def measure(label, command, environment, floor=None, runs=RUNS):
-    """Median CPU milliseconds of the command and of its floor (a label and a command), peak MiB."""
+    """Median CPU milliseconds of a command and of its floor (label, command), and peak MiB."""
     commands = [command] if floor is None else [command, floor[1]]
     for each in commands:
         run_once(each, environment)
@@ -194,7 +194,7 @@ ELEMENTS = {SIMPLE: 1, STATE: 4, HISTOGRAM: 8, SIMPLE_ARRAY: 2}
 
 
 def report_channels(count, formats):
-    """A recording of report channels, of which drivers have a hundred each."""
+    """A recording of report channels, a hundred for each driver."""
     services, hub = [], []
     for driver in range(1, count // 100 + 1):
         legend = []
@@ -219,7 +219,7 @@ def report_channels(count, formats):
 
 
 def channels_shown(command, environment):
-    """How many channels the output tells of, each once."""
+    """How many different channels the output mentions."""
     output = subprocess.run(command, env=environment, check=True, capture_output=True,
                             text=True).stdout
     return len(set(re.findall(r"channel \d+ of driver \d+", output)))
@@ -262,7 +262,7 @@ def growth(bin_directory):
         device = Device(bin_directory)
         device.tool("stat", "import", "-", text="".join(scalar_lines(count)))
         device.whitelist(scalars=[f"com.example.scalar.{i:06}" for i in range(0, count, 2)])
-        # One run first: it leaves what every later run finds.
+        # A first run leaves the state that every later run finds.
         run_once(device.daemon("-f"), device.environment)
         output = subprocess.run(
             ["valgrind", "--tool=callgrind", "--callgrind-out-file=/dev/null", *device.daemon("-f")],
