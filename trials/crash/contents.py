@@ -1,4 +1,4 @@
-"""What a device holds, read without tavrel's own programs."""
+"""The contents of a device, read without tavrel's own programs."""
 
 import functools
 import hashlib
@@ -23,7 +23,7 @@ class Broken(Exception):
 
 
 def tree_digest(root):
-    """Of all that programs can read there."""
+    """A digest of everything that programs can read there."""
     digest = hashlib.sha256()
     for folder, folders, files in os.walk(root):
         folders.sort()
@@ -38,7 +38,7 @@ def tree_digest(root):
 
 
 def names(folder):
-    """Without what a write that was cut off leaves."""
+    """The names in a folder, without the leftovers of an interrupted write."""
     if not folder.is_dir():
         return []
     found = sorted(name for name in os.listdir(folder) if not name.startswith(".tavrel-"))
@@ -59,7 +59,7 @@ def number(packed):
 
 
 def joined(database, runs):
-    """The bytes of a distribution's values, and of their offsets."""
+    """The bytes of a distribution's values, and those of their offsets."""
     packed, values, offsets = list(runs), b"", b""
     while packed:
         first, chunks, count = number(packed), number(packed), number(packed)
@@ -74,7 +74,7 @@ def joined(database, runs):
 
 
 def statistics(root, scratch):
-    """All rows of the store, which must be sound. It is read from a copy."""
+    """All rows of the store, which must be sound. Reads a copy of it."""
     present = names(root / STORE)
     name = "BHDataStore.sqlitedb"
     parts = [(root / STORE / file).read_bytes() if file in present else b""
@@ -83,7 +83,7 @@ def statistics(root, scratch):
 
 
 class Parts(list):
-    """The files of a store. Many states have the same ones, which are read once."""
+    """The files of a store. Many states have the same files, so these are read only once."""
 
     def __init__(self, parts):
         super().__init__(parts)
@@ -134,13 +134,13 @@ def parsed(content):
 def property_list(path):
     try:
         return dict(parsed(path.read_bytes()))
-    except Exception as error:  # whatever the parser says of it
+    except Exception as error:  # whatever the parser raises
         raise Broken(f"{path.name} is no property list: {error}") from None
 
 
 def log(folder, name):
-    """The log's content and metadata as text, without what is another each time it is made; the
-    change of the system that it tells; the tasking in force."""
+    """Returns the log's content and metadata as text, without the parts that differ each time it is
+    made; the system change that it reports; the tasking in force."""
     stem = name.removesuffix(".log")
     path = folder / f"{stem}.metadata.plist"
     if not path.exists():

@@ -1,5 +1,5 @@
-"""Two days of a device on which everything is switched on, as steps between which the device is
-looked at."""
+"""Two days of a device on which everything is switched on, as steps between which
+its state is examined."""
 
 import base64
 import collections
@@ -18,14 +18,14 @@ LONGEST = 900  # seconds for one command
 DOMAIN = "com.norvane.tallied.tavrel.plist"
 LAST_DAY = (DOMAIN, "LastCrashLogSerializationDateInDaysSince1970")
 
-# `clock` is the time of the step, `next_clock` that of the next run after a power cut in it.
-# `whole`: its changes of statistics and preferences are there together or not at all. `again` are
-# commands that are repeated after a cut.
+# `clock` is the time of the step, `next_clock` the time of the next run after a power cut in the
+# step. `whole`: the step's changes of statistics and preferences appear together or not at all.
+# `again`: commands that are repeated after a power cut.
 Step = collections.namedtuple("Step", "name clock next_clock whole action again")
 
 
 class Device:
-    """A device root. Its /run is memory, beside it."""
+    """A device root. Its /run is beside it and stands for memory."""
 
     def __init__(self, root, programs, preload):
         self.root, self.programs = pathlib.Path(root), pathlib.Path(programs)
@@ -52,13 +52,13 @@ class Device:
         self.run("tavrelctl", *arguments, text=text)
 
     def forget_memory(self):
-        """As when the power is cut."""
+        """Loses everything in memory, as in a power cut."""
         memory = self.root.parent / "memory"
         shutil.rmtree(memory, ignore_errors=True)
         (memory / "tavrel/stat").mkdir(parents=True)
 
     def write(self, name, content):
-        """A file of the device's maker."""
+        """Writes a file that the device's maker provides."""
         path = self.root / name
         path.parent.mkdir(parents=True, exist_ok=True)
         new = path.with_name(".new")
@@ -72,7 +72,7 @@ class Device:
         os.close(folder)
 
     def next_run(self, step):
-        """What the device does when it has power again."""
+        """Does what the device does once power is back."""
         self.forget_memory()
         self.clock = step.clock
         for command in step.again:
@@ -82,7 +82,7 @@ class Device:
 
 
 class Server(threading.Thread):
-    """Confirms each log, after `received` was told its name."""
+    """Confirms each log after passing its name to `received`."""
 
     def __init__(self, received):
         super().__init__(daemon=True)
@@ -114,7 +114,7 @@ def version(build):
 
 
 def lines(day, name, scalars, values):
-    """Statistics in the form of an import."""
+    """Statistics in the import format."""
     text = "".join(f"scalar\t{day}\tcom.example.{name}{i}\t{i * 37 + day}\n"
                    for i in range(scalars))
     return text + "".join(f"value\t{day}\tcom.example.{name}{i % 7}.d\t{i % SECONDS}\t{i}.25\n"
@@ -122,7 +122,7 @@ def lines(day, name, scalars, values):
 
 
 def prepare(device, day, url):
-    """Everything that is there before the first of the two days."""
+    """Sets up everything that exists before the first of the two days."""
     device.clock = day * SECONDS
     os.symlink("../memory", device.root / "run")
     device.forget_memory()
@@ -152,7 +152,7 @@ def prepare(device, day, url):
 
 
 def steps(day):
-    """For the two days that begin at `day`."""
+    """The steps of the two days that begin with `day`."""
     noon, second = day * SECONDS + 43200, (day + 1) * SECONDS + 1800
     third = second + SECONDS
 
@@ -218,5 +218,5 @@ def steps(day):
         Step("forced run", second, third, False, runs("tavrel", "-f"), ()),
         Step("erasure", second, third, False, runs(*erase), (erase,)),
         Step("withdrawal", second, third, False, runs(*deny), (deny,)),
-        Step("rest", second, third, True, lambda device: None, ()),  # the withdrawal is done
+        Step("rest", second, third, True, lambda device: None, ()),  # the withdrawal is complete
     ]

@@ -1,19 +1,19 @@
-"""The write of f2fs that a power cut can lose although its fsync has returned.
+"""The write of f2fs that a power cut can lose even though its fsync has returned.
 
-An fsync waits for the blocks of nodes that it wrote and flushes the device then. In Linux 6.1
-fs/f2fs/node.c numbers these blocks from 0 after each checkpoint and takes the number 0 for "wrote
-none", so that the first one may reach the device after the flush. Other kernels were not looked at,
-and are not excused.
+An fsync waits for the node blocks that it wrote and then flushes the device. In Linux 6.1,
+fs/f2fs/node.c numbers these blocks from 0 after each checkpoint but takes the number 0 to mean
+"wrote none", so the first one may reach the device after the flush. Other kernels were not
+examined, and are not excused.
 """
 
 import struct
 
 from write_log import DISCARD, FLUSH, FUA, MARK
 
-KERNEL = "6.1."  # the versions that are known to do so
+KERNEL = "6.1."  # the versions known to do so
 BLOCK = 4096
-FOOTER = 4072  # of a node block: node, inode, flags, version of the checkpoint, next address
-FSYNC = 2  # in its flags
+FOOTER = 4072  # at the end of a node block: node, inode, flags, checkpoint version, next address
+FSYNC = 2  # one of these flags
 
 
 def has_fault(kind, kernel):
@@ -31,10 +31,10 @@ def is_fsynced_node(log, entry, version):
 
 class UnawaitedNodes:
     def __init__(self, log):
-        """Finds such writes: each came right after the flush of its fsync, and right before another
-        write; before another flush it could be of an fsync that has not returned."""
+        """Finds such writes: each comes right after the flush of its fsync, and right before
+        another write. Before another flush, it could belong to an fsync that has not returned."""
         self.log = log
-        self.after = {}  # the positions, by that of the flush
+        self.after = {}  # positions, by the position of the flush
         version = None
         numbers = [number for number, entry in enumerate(log.entries) if not entry.flags & MARK]
         for before, number, behind in zip(numbers, numbers[1:], numbers[2:]):
@@ -47,9 +47,9 @@ class UnawaitedNodes:
                     self.after[before] = number
 
     def lost(self, flush, end, last):
-        """The position of such a write that is missing, though its fsync had returned, when all up
-        to the flush is there and the power is cut at `end`: something is there that was written
-        later (`last` is its position), or was told to the world."""
+        """Returns the position of such a write that is missing although its fsync had returned.
+        Everything up to `flush` is there, and the power is cut at `end`. The fsync had returned if
+        anything written later is there (`last` is its position) or was sent out."""
         position = self.after.get(flush)
         if position is None:
             return None

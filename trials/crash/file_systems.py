@@ -1,4 +1,4 @@
-"""The file systems that are tried, and how they are mounted."""
+"""The file systems under test, and how they are mounted."""
 
 import collections
 import ctypes
@@ -6,7 +6,7 @@ import fcntl
 import os
 import subprocess
 
-# `atom` is what a drive writes as a whole: f2fs relies on whole blocks, ext4 on sectors.
+# `atom` is what a drive writes atomically: f2fs relies on whole blocks, ext4 on sectors.
 Kind = collections.namedtuple("Kind", "type make options size atom check")
 MEBIBYTE = 1 << 20
 EXT4 = ["mkfs.ext4", "-q", "-F", "-E", "lazy_itable_init=0,lazy_journal_init=0,nodiscard"]
@@ -39,7 +39,7 @@ def mount(device, folder, kind):
 
 
 def mount_in_private():
-    """Other processes that copy their mounts would keep a file system that is unmounted here."""
+    """Makes mounts private: copies in other processes would keep file systems mounted."""
     if libc.unshare(NEW_NAMESPACE) or libc.mount(b"none", b"/", None, RECURSIVE | PRIVATE, None):
         raise OSError(ctypes.get_errno(), os.strerror(ctypes.get_errno()))
 
@@ -50,7 +50,7 @@ def unmount(folder):
 
 
 class Loop:
-    """A block device made of a file. Without a process, as thousands are made."""
+    """A block device made of a file, without starting a process, because thousands are made."""
 
     def __init__(self, file):
         with open("/dev/loop-control", "rb") as control:
@@ -60,7 +60,7 @@ class Loop:
                 try:
                     fcntl.ioctl(self.device, LOOP_SET_FD, file.fileno())
                     return
-                except OSError:  # somebody else took it
+                except OSError:  # another process took it
                     os.close(self.device)
 
     def close(self):

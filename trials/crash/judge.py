@@ -5,8 +5,8 @@
              [--script COMMAND]
 
 State numbers begin with the points after each flush, FUA write and mark; the others are torn. For a
-broken state it prints COMMAND with what makes the state again. Ends with 1 when a state breaks a
-promise, or when there was no time to judge any.
+broken state, prints COMMAND with the arguments that make the state again. Exits with 1 when a state
+breaks a promise, or when there was no time to judge any.
 """
 
 import argparse
@@ -28,7 +28,7 @@ from verdict import Undisturbed
 from write_log import FLUSH, FUA, MARK, Image, WriteLog, torn
 
 ROUND = 500  # states that are made in one pass over the log
-# All before the position is there, and some of what is from there to the cut, if there is a cut.
+# Everything before `position` is there, and some of what is between it and `cut`, if any.
 State = collections.namedtuple("State", "number position cut")
 
 
@@ -48,15 +48,15 @@ class Judge:
         kernel = (options.recording / "kernel").read_text("ascii")
         self.unawaited = UnawaitedNodes(self.log) if has_fault(self.kind, kernel) else None
         self.image = (work / "image").open("w+b")
-        self.devices = {}  # verdicts by step and what is on the device
+        self.devices = {}  # verdicts, by step and content of the device
         self.seen = {}  # by step and content
         self.judged = collections.Counter()
         self.failures = 0
         self.find_points()
 
     def find_points(self):
-        """Positions in the log where all before is durable, and the windows between flushes. After
-        a mark, what was not flushed is lost: it comes with the next flush."""
+        """Finds positions before which all is durable, and the windows between flushes. Up to a
+        mark, unflushed writes are missing: they are logged only with the next flush."""
         self.marks, self.points, flushes, waiting = [], [], [], 0
         for number, entry in enumerate(self.log.entries):
             waiting = 0 if entry.flags & FLUSH else waiting + (not entry.flags & (FUA | MARK))
@@ -83,7 +83,7 @@ class Judge:
         return State(number, start, choice.randint(start + 1, end))
 
     def where(self, position):
-        """The step in which the cut came, and the logs that the server had confirmed."""
+        """Returns the step in which the cut came, and the logs that the server had confirmed."""
         before = [words for place, words in self.marks[:bisect.bisect_left(
             self.marks, (position, []))]]
         done = [int(words[1]) for words in before if words[0] == "step"]
@@ -91,7 +91,7 @@ class Judge:
         return min((done[-1] if done else 0) + 1, len(self.steps)), received
 
     def judge(self, state):
-        """The step, what is broken, and whether nothing is once f2fs has waited."""
+        """Returns the step, what is broken, and whether f2fs's unawaited write explains it."""
         number, received = where = self.where(state.cut or state.position)
         pieces = () if state.cut is None else torn(
             self.log, state.position, state.cut,
@@ -106,7 +106,7 @@ class Judge:
         return self.devices[device]
 
     def late(self, state, pieces):
-        """The position of a write that f2fs has lost."""
+        """The position of a write that f2fs has lost, or None."""
         place = state.position - (state.cut is None)
         while place and not self.log.entries[place].flags & (FLUSH | FUA):
             place -= 1
@@ -114,7 +114,7 @@ class Judge:
                                    pieces[-1][0] if pieces else None)
 
     def verdict(self, state, number, received, pieces):
-        """What is broken, or None."""
+        """Returns what is broken, or None."""
         self.disk.advance(state.position)
         self.disk.tear(pieces, self.kind.atom)
         self.disk.write(self.image)

@@ -43,7 +43,7 @@ static void stop(void) {
   if (getenv("CRASH_STOPS") != NULL) raise(SIGSTOP);
 }
 
-/* The function of the C library between two stops. */
+/* Calls the function of the C library between two stops. */
 #define BETWEEN_STOPS(name, parameters, arguments) \
   int name parameters {                            \
     static __typeof__(&name) real = NULL;          \

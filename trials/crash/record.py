@@ -1,10 +1,10 @@
 #!/usr/bin/env python3
-"""Runs in a guest: plays the two days on a file system and records what its block device is given.
+"""Runs in a guest: plays the two days on a file system and records the writes to its block device.
 
     record.py FILE-SYSTEM PROGRAMS DAY LOG AFTER
 
-The log of writes goes to the disk LOG; as a tar file, the device after each step and the kernel's
-version to AFTER.
+The log of writes goes to the disk LOG. AFTER gets a tar file with the device after each step,
+and the kernel's version.
 """
 
 import pathlib
@@ -31,7 +31,7 @@ def main():
     root.mkdir(parents=True)
     call("cc", "-O1", "-shared", "-fPIC", "-o", str(WORK / "preload.so"),
          str(pathlib.Path(__file__).parent / "preload.c"))
-    # Written back soon, so that much reaches the device in another order than it was written.
+    # Write back soon, so that much reaches the device in a different order than it was written.
     for name, value in (("dirty_writeback_centisecs", 10), ("dirty_expire_centisecs", 20)):
         pathlib.Path("/proc/sys/vm", name).write_text(str(value), encoding="ascii")
     with open(WORK / "data", "w+b") as file:
@@ -39,7 +39,7 @@ def main():
         loop = Loop(file)
     call("dmsetup", "create", "--noudevrules", "--noudevsync", NAME, "--table",
          f"0 {kind.size // 512} log-writes {loop.path} {log}")
-    path = "/dev/dm-0"  # there is no udev to give it a name
+    path = "/dev/dm-0"  # no udev runs that could name it
     call(*kind.make, path)
     mount(path, root, kind)
 

@@ -1,11 +1,11 @@
 #!/usr/bin/env python3
 """Runs in a guest: plays the two days on UBIFS, on a partition of a simulated NAND chip. The device
-is stopped before and after calls that a file system must keep in order; what the chip then holds is
-what a power cut would leave. It is written to another partition, mounted and checked there.
+stops before and after calls that a file system must keep in order; the content of the chip is then
+what a power cut would leave. It is copied to another partition, mounted and checked there.
 
     ubifs.py PROGRAMS DAY STATES SECONDS SEED [FOLDER]
 
-FOLDER has nand.ko and nandsim.ko, where the kernel lacks them. Ends with 1 when a state breaks a
+FOLDER has nand.ko and nandsim.ko if the kernel lacks them. Exits with 1 when a state breaks a
 promise, or when there was no time to judge any.
 """
 
@@ -24,30 +24,30 @@ from file_systems import Kind, call, mount, unmount
 from verdict import Undisturbed
 
 WORK = pathlib.Path("/dev/shm/crash")
-# A chip of 128 MiB with pages of 2 KiB; of it, a partition for the device and one for the states.
+# A chip of 128 MiB with pages of 2 KiB; one partition is for the device, another for the states.
 CHIP = ["first_id_byte=0xec", "second_id_byte=0xa1", "third_id_byte=0x00", "fourth_id_byte=0x15"]
 BLOCKS = 96
 PAGE, BLOCK, RAW_BLOCK = 2048, 1 << 17, 64 * (2048 + 64)
-PAGES = WORK / "pages"  # what nandsim keeps; of erased pages it has what was in them before
-BAD_BLOCKS = 1  # of 1024 that UBI keeps blocks for
+PAGES = WORK / "pages"  # nandsim's backing file; erased pages still have their old content there
+BAD_BLOCKS = 1  # of 1024, for which UBI reserves blocks
 ERASED = b"\xff" * PAGE
 KIND = Kind("ubifs", [], "", 0, 0, [])
 VOLUME = "crash"
-SUDDEN = 0.5  # of the stops that are followed by one at a random moment
-LONGEST_RUN = 0.02  # seconds until that
+SUDDEN = 0.5  # fraction of stops that another one at a random moment follows
+LONGEST_RUN = 0.02  # seconds until then
 
 
 class Chip:
-    """The contents of the first partition. Blocks of equal content are kept once."""
+    """The contents of the first partition. Blocks with equal content are stored once."""
 
     def __init__(self):
         self.raw, self.names, self.blocks = [None] * BLOCKS, [None] * BLOCKS, {}
 
     def read(self):
-        """Reads what has changed. A block that is erased and not yet written again counts as
-        unchanged: its content is of no use any more."""
+        """Reads what has changed. A block that is erased and not yet rewritten counts as unchanged,
+        because its content no longer matters."""
         changed = True
-        while changed:  # the file system may just be writing what it keeps in memory for seconds
+        while changed:  # the file system may be writing what it holds in memory for seconds
             changed = False
             with open(PAGES, "rb") as pages, open("/dev/mtd0", "rb", buffering=0) as device:
                 for number in range(BLOCKS):
@@ -62,8 +62,8 @@ class Chip:
         return tuple(self.names)
 
     def between(self, before, after):
-        """What the chip held between two contents, where that is certain: pages of a block are
-        written in their order, and no other block changed."""
+        """Yields what the chip held between two contents, where that is certain: pages of a block
+        are written in order, and no other block has changed."""
         changed = [number for number in range(BLOCKS) if before[number] != after[number]]
         if len(changed) != 1 or before[changed[0]] is None:
             return
@@ -77,7 +77,7 @@ class Chip:
                 yield (*before[:number], hash(block), *before[number + 1:])
 
     def write(self, names):
-        """To the second partition."""
+        """Writes a content to the second partition."""
         call("flash_erase", "--quiet", "/dev/mtd1", "0", "0")
         with open("/dev/mtd1", "r+b", buffering=0) as device:
             for number, name in enumerate(names):
@@ -89,11 +89,11 @@ class Chip:
 
 
 class Recorder:
-    """Runs the programs of a device and stops them again and again."""
+    """Runs a device's programs and stops them again and again."""
 
     def __init__(self, chip, seed):
         self.chip, self.random = chip, random.Random(seed)
-        self.states = []  # the step, the logs that were received, and the chip's content
+        self.states = []  # the step, the received logs, and the chip's content
         self.step, self.received = 0, set()
 
     def begin(self, step):
@@ -156,7 +156,7 @@ def record(device, recorder, day):
 
 
 def fault_of(state, chip, device, undisturbed, seen):
-    """What is broken, and whether the content was new."""
+    """Returns what is broken, and whether the content was new."""
     number, received, names = state
     chip.write(names)
     call("dmesg", "--clear")

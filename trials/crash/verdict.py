@@ -1,4 +1,4 @@
-"""What must hold after a power cut in a step, and after the run that follows it."""
+"""Checks what must hold after a power cut in a step, and after the run that follows it."""
 
 import pathlib
 import shutil
@@ -7,13 +7,13 @@ import subprocess
 from contents import Broken, Contents
 from days import LAST_DAY
 
-# What tidying counts is written when it ends.
+# These counts of tidying are written when it ends.
 COUNTS = "com.norvane.tavrel.limits."
 PERMISSION = ("com.norvane.zentrix.plist", "DiagnosticSubmissionEnabled")
 
 
 def differing(what, found, allowed):
-    """The entries that are as in none of the allowed."""
+    """Fails on entries that match none of the allowed ones."""
     keys = set(found).union(*allowed)
     wrong = [key for key in sorted(keys, key=str)
              if found.get(key) not in [one.get(key) for one in allowed]]
@@ -28,7 +28,7 @@ def without_counts(statistics):
 
 
 def one_of(what, found, allowed):
-    """As a whole like one of the allowed."""
+    """Fails unless the whole matches one of the allowed ones."""
     if found not in allowed:
         differing(what, found, allowed)
         raise Broken(f"{what}: only a part of the changes is there")
@@ -52,12 +52,12 @@ class Undisturbed:
         self.after = [Contents(self.folder / str(number), work / "scratch")
                       for number in range(len(steps) + 1)]
         self.ends = {}
-        self.known = {}  # the content of each log that ever was
+        self.known = {}  # the content of each log that ever existed
         for contents in self.after:
             self.known.update(contents.logs)
 
     def end(self, number, done):
-        """After the next run, when the step's changes were there (done is 1) or not (0)."""
+        """The state after the next run, with the step's changes (done is 1) or without them (0)."""
         if (number, done) not in self.ends:
             shutil.rmtree(self.device.root)
             shutil.copytree(self.folder / str(number - 1 + done), self.device.root, symlinks=True)
@@ -69,7 +69,7 @@ class Undisturbed:
         return self.ends[number, done]
 
     def fault(self, device, number, received):
-        """What is broken on a device whose power was cut in the step; it has its next run."""
+        """Returns what is broken after a power cut in the step; performs the next run."""
         try:
             self.check_cut(number, Contents(device.root, self.work / "scratch"), received)
             device.next_run(self.steps[number - 1])
@@ -79,7 +79,7 @@ class Undisturbed:
             return str(error)
 
     def check_cut(self, number, found, received):
-        """Before anything runs again."""
+        """Checks the device before anything runs again."""
         step, before, after = self.steps[number - 1], self.after[number - 1], self.after[number]
         compare = one_of if step.whole else differing
         compare("statistics", found.statistics, (before.statistics, after.statistics))
@@ -106,7 +106,7 @@ class Undisturbed:
             require(f"{done}, logs", after.logs, set(found.logs) | received)
 
     def check_end(self, number, found, received):
-        """After the next run."""
+        """Checks the device after the next run."""
         ends = [self.end(number, done) for done in (0, 1)]
         rows, *allowed = [{**without_counts(one.statistics), **one.preferences}
                           for one in (found, *ends)]
@@ -117,7 +117,7 @@ class Undisturbed:
         logs, changes = [log[0] for log in every], [log[1] for log in every]
         wanted = [contents_of(end.logs.values()) for end in ends]
         require("logs at the end", wanted[0] & wanted[1], logs)
-        # A run that is repeated finds its own tasking in force.
+        # A repeated run finds its own tasking in force.
         require("taskings in logs", [log[2] for log in every],
                 [log[2] for end in (*self.after, *ends) for log in end.logs.values()])
         require("logs of the end", logs, wanted[0] | wanted[1] | contents_of(self.known.values()))
@@ -127,7 +127,7 @@ class Undisturbed:
         for change in {change for end in ends for _, change, _ in end.logs.values() if change}:
             allowed = [[told for _, told, _ in end.logs.values()].count(change) for end in ends]
             if "run" in self.steps[number - 1].name:
-                allowed.append(0)  # a run notes a change before it files the log that tells of it
+                allowed.append(0)  # a run notes a change before it files the log that reports it
             if changes.count(change) not in allowed:
                 raise Broken(f"the change from {change} is reported {changes.count(change)} times")
         require("records at the end", ends[0].records & ends[1].records, found.records)

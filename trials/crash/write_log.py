@@ -7,13 +7,13 @@ import struct
 SECTOR = 512
 MAGIC = 0x6A736677736872
 FLUSH, FUA, DISCARD, MARK = 1, 2, 4, 8
-# A flush makes durable what stands before it; FUA makes durable what is written with it. A write
-# without FUA is logged with the next flush after its end, so a mark may come before it.
+# A flush makes everything before it durable; FUA makes the write itself durable. A write without
+# FUA is logged with the next flush after its completion, so a mark may come before it.
 Entry = collections.namedtuple("Entry", "flags start length data")
 
 
 class WriteLog:
-    """The entries in their order. A mark is text; `data` of a write is its place in the log."""
+    """The entries, in order. A mark is text; the `data` of a write is its offset in the log."""
 
     def __init__(self, path):
         with open(path, "rb") as file:
@@ -35,16 +35,16 @@ class WriteLog:
                 place = data if flags & DISCARD else data + sectors * SECTOR
 
     def content(self, entry):
-        """What the entry leaves on the device; what was discarded reads as zeros."""
+        """What the entry leaves on the device; discarded ranges read as zeros."""
         if entry.flags & DISCARD:
             return bytes(entry.length)
         return self.bytes[entry.data:entry.data + entry.length]
 
 
 def torn(log, position, cut, random, atom):
-    """Of the entries from a position to the cut any may be missing or torn, but none that were
-    written with FUA. The numbers of those that are there, each with the atoms of it that are, or
-    None when it is whole."""
+    """Of the entries from a position to the cut, any may be missing or torn except those
+    written with FUA. Returns the numbers of those that are there, each with the atoms of it
+    that are, or None if it is whole."""
     pieces = []
     share = random.choice([0.1, 0.5, 0.9])
     for number in range(position, cut):
@@ -62,7 +62,7 @@ def torn(log, position, cut, random, atom):
 
 
 class Image:
-    """A device whose writes can be taken back."""
+    """A device whose writes can be undone."""
 
     def __init__(self, log, size, chunk=65536):
         self.log, self.chunk = log, chunk
@@ -78,7 +78,7 @@ class Image:
             self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
 
     def advance(self, position):
-        """All of the entries before the position, in full."""
+        """Applies all entries before the position, in full."""
         while self.position < position:
             entry = self.log.entries[self.position]
             if entry.length:
@@ -87,7 +87,7 @@ class Image:
         self.undo = []
 
     def tear(self, pieces, atom):
-        """Writes entries in part, as `torn` chose them. Undone by `mend`."""
+        """Writes parts of entries, as `torn` chose them; `mend` undoes that."""
         for number, kept in pieces:
             entry = self.log.entries[number]
             content = self.log.content(entry)

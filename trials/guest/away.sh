@@ -1,4 +1,4 @@
-# A server that is away, a clock that goes back, and a server that is back.
+# A server that is unreachable, a clock set back, and the server's return.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 nginx -s quit 2>/dev/null
 clock '2037-11-24 00:07'
@@ -7,7 +7,7 @@ settle
 expect "an upload without the server" "success 75" "$(outcome tavrel-upload.service)"
 expect "the log waits" log-tallied "$(logs pending)$(logs outbox)"
 
-# A service that waits for its next attempt holds back what starts it.
+# A service that waits for its next attempt blocks the units that start it.
 systemctl stop tavrel-upload.service 2>/dev/null
 clock '2037-11-22 12:00'
 systemctl start tavrel-daily.service

@@ -1,9 +1,9 @@
-# What the scripts of the guest share. They print a line for each check; the status of `checked` is 1
-# when one of them failed.
+# Functions that the guest's scripts share. They print a line for each check; `checked` returns
+# 1 when one of them failed.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 failures=0
 
-# expect WHAT EXPECTED ACTUAL: both texts are the same, byte by byte.
+# expect WHAT EXPECTED ACTUAL: checks that both texts are the same, byte by byte.
 expect() {
   if [ "$2" = "$3" ]; then
     echo "ok       $1"
@@ -18,7 +18,7 @@ ACTUAL
   fi
 }
 
-# most WHAT LIMIT ACTUAL: a number is not above a limit.
+# most WHAT LIMIT ACTUAL: checks that a number does not exceed a limit.
 most() {
   if [ "$3" -le "$2" ]; then
     echo "ok       $1: $3, at most $2"
@@ -28,7 +28,7 @@ most() {
   fi
 }
 
-# note WHAT: a figure that nothing is expected of.
+# note WHAT: prints a figure without a check.
 note() { echo "         $1"; }
 
 checked() {
@@ -36,7 +36,7 @@ checked() {
   return "$((failures > 0))"
 }
 
-# Sets the clock, and waits until what became due has ended.
+# Sets the clock, and waits until everything that became due has ended.
 clock() {
   date --utc --set "$1" >/dev/null
   settle
@@ -45,14 +45,14 @@ clock() {
 services="tavrel-folders.service tavrel-collect.service tavrel-fold.service tavrel-health.service
   tavrel-daily.service tavrel-upload.service"
 
-# Whether a service of tavrel is at work or about to be. An upload that waits for its next attempt is
-# neither.
+# Whether a service of tavrel is working or about to. An upload that waits for its
+# next attempt does not count.
 busy() {
   # shellcheck disable=SC2086
   systemctl show -P Job -P SubState $services | grep -qvE '^(|dead|failed|auto-restart)$'
 }
 
-# Until nothing of tavrel is on its way. After work it looks twice, because one unit starts another.
+# Waits until tavrel is idle. After work, checks again, because one unit starts another.
 settle() {
   sleep 0.3
   while busy; do
@@ -61,16 +61,16 @@ settle() {
   done
 }
 
-# What the file system's block device was given to write since the system started, in bytes.
+# Bytes written to the file system's block device since the system started.
 written() {
   sync
   awk '{print $7 * 512}' /sys/block/vda/stat
 }
 
-# CPU time of all units of tavrel since the slice was made, in microseconds.
+# CPU time of all tavrel units since the slice was made, in microseconds.
 processor() { awk '$1 == "usage_usec" {print $2}' /sys/fs/cgroup/tavrel.slice/cpu.stat; }
 
-# What the unit's last run said of itself: its result and exit status.
+# The result and exit status of a unit's last run.
 outcome() { systemctl show -P Result -P ExecMainStatus "$1" | paste -sd ' '; }
 
 submission=/var/mobile/Library/Logs/Submission

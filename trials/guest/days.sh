@@ -1,4 +1,4 @@
-# Three days by the clock: what is recorded on one leaves the device on the next.
+# Three days by the clock: what one day records leaves the device on the next.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 mkdir -p '/Library/Application Support/Brimhold'
 cp "$here/whitelist.plist" '/Library/Application Support/Brimhold/Whitelist_Pellio.plist'
@@ -12,7 +12,7 @@ record() {
   [ "$answer" = recorded ] || expect "a value is recorded" recorded "$answer"
 }
 
-# What the kernel accounts of it to the units of tavrel, without the file system's own journal.
+# The kernel's account of what tavrel's units wrote, without the file system's own journal.
 written_by_units() {
   sync
   sed -n 's/.* wbytes=\([0-9]*\).*/\1/p' /sys/fs/cgroup/tavrel.slice/io.stat |
@@ -29,7 +29,7 @@ record 12
 record 4
 
 systemctl set-property --runtime tavrel.slice IOAccounting=yes
-# The sampler with a minute of a second, and the timer that does without it.
+# The sampler with a period of a second instead of a minute, and the timer, which needs no sampler.
 mkdir -p /run/systemd/system/tavrel-sampler.service.d
 printf '[Service]\nExecStart=\nExecStart=/usr/bin/tavrelctl stat collect --every 1\n' \
   >/run/systemd/system/tavrel-sampler.service.d/quick.conf
@@ -49,7 +49,7 @@ for start in 1 2 3 4; do systemctl start tavrel-collect.service; done
 start_used=$((($(processor) - used) / 4))
 
 # The day that is measured: a sample for each minute, the folds, the run and the upload. Its samples
-# are counted, so nothing else takes any; their CPU time is that of the sampler above.
+# are counted, so nothing else takes any; their CPU time was measured with the sampler above.
 clock '2037-11-22 00:00'
 echo "minutes and hours of a day"
 writes=$(written) own_writes=$(written_by_units) used=$(processor)
@@ -58,7 +58,7 @@ for hour in $hours; do
   for sample in $samples; do
     tavrelctl stat collect --once >/dev/null
   done
-  # As the kernel and the journal do some time after a change.
+  # The kernel and the journal do this themselves some time after a change.
   journalctl --quiet --sync && sync
 done
 arrived=$(received)

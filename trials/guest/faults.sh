@@ -1,20 +1,20 @@
-# Every unit with its folders missing, on a read-only system, with folders that are read-only, of
-# others, and full. A unit that cannot work fails with a status and a line; none is ended by a signal
-# or hangs.
+# Runs every unit with its folders missing, on a read-only system, and with folders that are
+# read-only, owned by others, or full. A unit that cannot work must fail with a status and a
+# message; none may be killed by a signal or hang.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 kept="/var/mobile /var/lib/tavrel"
 folders="$kept /run/tavrel"
 store="statistics store /var/mobile/Library/Brimhold/BHDataStore.sqlitedb"
 
-# Whether a unit has ended or waits for something to do.
+# Whether a unit has ended or is waiting for something to do.
 idle() {
   process=$(systemctl show -P MainPID "$1")
-  # Until it is executed, the name of a program is in parentheses.
+  # Until the program is executed, its name is in parentheses.
   [ "$process" = 0 ] || awk '/^Name:/ {executed = $2 !~ /[(]/} /^State:/ {waits = $2 == "S"}
     END {exit !(executed && waits)}' "/proc/$process/status"
 }
 
-# Lines of a unit's last start from warnings up.
+# The messages of a unit's last start, from warnings upwards.
 warnings() {
   journalctl --quiet --sync
   invocation=$(systemctl show -P InvocationID "$1")
@@ -22,7 +22,7 @@ warnings() {
     sed "s/^/  /; s|$store|STORE|; s/ [0-9]* values/ N values/"
 }
 
-# What each unit's start came to: of those that end, and of those that stay.
+# The outcome of starting each unit: first those that end, then those that stay.
 outcomes() {
   systemctl reset-failed 'tavrel*.service'
   for unit in collect fold daily health upload metrics; do
@@ -36,7 +36,7 @@ outcomes() {
     until idle "$unit.service" 2>/dev/null; do sleep 0.1; done
     echo "$unit: $(systemctl is-active "$unit.service") $(outcome "$unit.service")"
     warnings "$unit.service"
-    systemctl stop "$unit.service" 2>/dev/null  # warns of sockets that can start it
+    systemctl stop "$unit.service" 2>/dev/null  # it warns of sockets that can start the unit
   done
 }
 
@@ -60,12 +60,12 @@ uncover() {
   for folder in "$@"; do umount "$folder"; done
 }
 
-# What waits since the power cut goes with the first upload.
+# The first upload takes everything that has waited since the power cut.
 nginx
 systemctl stop tavrel-fold.path tavrel-upload.path tavrel-sampler.service
 expect "units with their folders" "$all_work" "$(outcomes)"
 expect "nothing waits any more" "" "$(logs pending)$(logs outbox)"
-# It keeps files open for writing.
+# nginx keeps files open for writing, which prevents a read-only remount.
 nginx -s quit 2>/dev/null
 while [ -e /run/nginx.pid ]; do sleep 0.1; done
 
@@ -73,7 +73,7 @@ for folder in $folders; do mv "$folder" "$folder.kept"; done
 expect "units without their folders" "$all_work" "$(outcomes)"
 for folder in $folders; do rm -rf "$folder" && mv "$folder.kept" "$folder"; done
 
-# What a read-only system needs is writable. The journal keeps its files in /run meanwhile.
+# Keep writable what a read-only system needs. Meanwhile the journal keeps its files in /run.
 journalctl --relinquish-var
 cover mode=755 /var /tmp
 mount -o remount,bind,ro /

@@ -1,5 +1,5 @@
 #!/bin/sh
-# The first start of the guest's system, up to a pulled plug.
+# The first start of the guest's system, up to the moment when the plug is pulled.
 #   first-boot.sh whole|short PACKAGES LATER-PACKAGES
 # shellcheck disable=SC2034,SC2154 # The parts share variables.
 set -u

@@ -1,18 +1,18 @@
-# Installs the packages while the clock stands in 1970, as that of a device without a battery does.
+# Installs the packages while the clock shows 1970, as on a device without a battery.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 
-# Units of tavrel share a slice, which adds up their CPU time.
+# All tavrel units share a slice, which adds up their CPU time.
 for unit in tavrel.service tavrel-.service; do
   mkdir -p "/run/systemd/system/$unit.d"
   printf '[Service]\nSlice=tavrel.slice\n' >"/run/systemd/system/$unit.d/slice.conf"
 done
-# A random delay would begin anew with each jump of the clock.
+# Each jump of the clock would start a random delay again.
 for timer in daily fold upload; do
   mkdir -p "/run/systemd/system/tavrel-$timer.timer.d"
   printf '[Timer]\nRandomizedDelaySec=0\nAccuracySec=1s\n' \
     >"/run/systemd/system/tavrel-$timer.timer.d/exact.conf"
 done
-# And no run that is due by the time since the start.
+# Also prevent a run that is due because of the time since the start.
 printf 'OnBootSec=\nOnCalendar=*-*-* 00:05:00 UTC\n' \
   >>/run/systemd/system/tavrel-daily.timer.d/exact.conf
 systemctl daemon-reload

@@ -1,5 +1,5 @@
-# A power cut in the daily run of the next day. The plug is pulled when its log is there and it is
-# still at work: frozen, so that it does not come to its end meanwhile. The watcher yields to the run.
+# A power cut in the daily run of the next day. The plug is pulled when the log is there and the run
+# is still at work, frozen so that it cannot end first. The watcher's priority is below the run's.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 cat >/run/watch <<'WATCH'
 found=
@@ -9,7 +9,7 @@ done
 echo 1 >/sys/fs/cgroup/tavrel.slice/cgroup.freeze
 WATCH
 nice -n 10 sh /run/watch "$submission" &
-# Neither now nor after the start does an upload take the logs that are looked at.
+# Neither now nor after the start may an upload take the logs that are checked.
 systemctl stop tavrel-upload.timer
 touch -d '2037-11-25 01:00 UTC' /var/lib/systemd/timers/stamp-tavrel-upload.timer
 sync

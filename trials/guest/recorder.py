@@ -1,11 +1,11 @@
-"""Records a number for each line that arrives, as an ordinary user, and answers with a line."""
+"""Records a number for each arriving line, as an ordinary user, and answers with a line."""
 import os
 
 import brimhold
 
 starts = brimhold.Scalar("com.example.starts")
 seconds = brimhold.Distribution("com.example.seconds")
-# Open for both directions, pipes neither end nor lose what the other side has not taken yet.
+# Opened in both directions, pipes neither end nor lose what the other side has not read yet.
 with open(os.open("/run/recorder/in", os.O_RDWR)) as lines, \
         open(os.open("/run/recorder/out", os.O_RDWR), "w", buffering=1) as answers:
     for line in lines:

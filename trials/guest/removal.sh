@@ -11,8 +11,8 @@ expect "the data stays" BHDataStore.sqlitedb \
 apt-get purge -qq -y $(dpkg-query -W -f '${db:Status-Abbrev}${Package}\n' '*tavrel*' |
   sed -n 's/^rc *//p') >>/root/apt.log 2>&1
 expect "the packages are purged" 0 "$?"
-# What others wrote: the maker's whitelist, the server's name, the permission. The rest that has come
-# since the installation is the test's, and what apt, dpkg and useradd keep.
+# What others wrote stays: the maker's whitelist, the server's name, the permission. Anything else
+# that has appeared since the installation belongs to the test, or to apt, dpkg and useradd.
 expect "what is left" "/Library
 /Library/Application Support
 /Library/Application Support/Brimhold

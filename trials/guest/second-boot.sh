@@ -1,5 +1,5 @@
 #!/bin/sh
-# The start after the pulled plug.
+# The start after the plug was pulled.
 #   second-boot.sh whole|short
 set -u
 here=$(dirname "$0")

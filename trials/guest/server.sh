@@ -1,6 +1,6 @@
-# A server that takes logs: nginx in the guest, with the documented configuration.
+# A server that receives logs: nginx in the guest, with the documented configuration.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
-# After the day on which the programs were built, which they take for the earliest possible.
+# Later than the day of the build, which the programs take for the earliest possible day.
 clock '2037-11-20 22:40'
 server=/etc/tavrel-server
 mkdir -p "$server" /srv/tavrel/.unfinished /etc/credstore /etc/tavrel

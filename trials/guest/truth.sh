@@ -1,4 +1,4 @@
-# What the tool says after the plug was pulled, and that the next run makes up for it.
+# What the tool reports after the plug was pulled, and that the next run makes up for it.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 day_done() {
   tavrelctl prefs get com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970
@@ -20,7 +20,7 @@ expect "a run is due again without a midnight" 10min \
 systemctl start tavrel-daily.service
 settle
 expect "that run ends the day" 24799 "$(day_done)"
-# A day that is not done is done again as a whole.
+# A day that is not done is repeated as a whole.
 expect "the day has a second log" "log-tallied
 log-tallied" "$(logs pending)"
 expect "nothing is critical after it" "" "$(tavrelctl status --check | grep -E '^(CRITICAL|UNKNOWN)')"

@@ -1,4 +1,4 @@
-# A client of the service, and an upgrade with data, which is cut off and completed.
+# A client of the service, and an upgrade with data that is interrupted and then completed.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 socket=/run/tavrel/com.norvane.tallied.tavrel.socket
 expect "the service sleeps" inactive "$(systemctl is-active tavrel.service)"
@@ -10,12 +10,12 @@ rm "$submission"/pending/*
 expect "other users are refused" 1 "$(setpriv --reuid recorder --clear-groups \
   tavrelctl send force yesterday >/dev/null 2>&1; echo $?)"
 
-# An owner who does without readings of drives.
+# An owner who does not want readings of drives.
 systemctl disable --quiet --now tavrel-health.timer
 exported() { tavrelctl stat export | grep -F com.example. | sort; }
 before=$(exported)
 if [ "$extent" = whole ]; then
-  # The second package is being unpacked, the first is not configured.
+  # The second package is being unpacked, and the first is not configured yet.
   : >/root/dpkg.log
   dpkg --unpack "$later"/*.deb >/root/dpkg.log 2>&1 &
   dpkg=$!

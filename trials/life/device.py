@@ -1,4 +1,4 @@
-"""A device in a folder, and its programs, whose clocks show what the driver says."""
+"""A device in a folder, with programs whose clocks the driver controls."""
 
 import collections
 import fcntl
@@ -31,7 +31,7 @@ class Fault(Exception):
 
 
 class Clock:
-    """What the device's clocks show: the true time, and by how much the device is wrong."""
+    """The device's clocks: the true time, and how far the device is off."""
 
     def __init__(self, path, start):
         path.write_bytes(bytes(64))
@@ -64,7 +64,7 @@ class Clock:
         return self.now // SECONDS_PER_DAY
 
     def go_to(self, second):
-        """To a second of true time, which never goes back."""
+        """Moves to a second of true time, which never goes back."""
         assert second >= self.true
         self.true = second
         self.show()
@@ -86,7 +86,7 @@ class Device:
         self.environment = {"PATH": os.environ["PATH"], "TAVREL_ROOT": str(root),
                             "LD_PRELOAD": str(library), "LIFE_CLOCK": str(clock.path)}
         self.peaks = {}
-        self.kills = collections.Counter()  # that took place, by program
+        self.kills = collections.Counter()  # kills that took place, by program
         self.residents = {}
 
     # -- Files --------------------------------------------------------------------------------
@@ -103,7 +103,7 @@ class Device:
         try:
             return plistlib.loads((self.path(PREFERENCES) / f"{domain}.plist").read_bytes())
         except (FileNotFoundError, ExpatError, plistlib.InvalidFileException):
-            return {}  # as the programs read a damaged file
+            return {}  # the programs, too, read a damaged file as empty
 
     def logs(self):
         """The names of the logs in each folder."""
@@ -125,7 +125,7 @@ class Device:
         return status.f_bavail * status.f_frsize, status.f_blocks * status.f_frsize
 
     def fill(self, kibibytes):
-        """Leaves so much of the disk, in whole pages."""
+        """Leaves this much of the disk free, in whole pages."""
         free, _ = self.disk()
         with open(self.path("var/filler"), "ab") as file:
             os.posix_fallocate(file.fileno(), 0, max(free - kibibytes * 1024, 4096))
@@ -152,7 +152,7 @@ class Device:
         return ended
 
     def tool(self, *command, text=None):
-        """A command that must succeed."""
+        """Runs a command that must succeed."""
         done = self.run("tavrelctl", *command, text=text)
         if done.status:
             raise Fault(f"tavrelctl {' '.join(command)} ends with {done.status}: {done.err}")
@@ -174,7 +174,7 @@ class Device:
         self.residents.clear()
 
     def resident(self, name):
-        """Resident KiB and open descriptors of a program that lives on."""
+        """Resident KiB and open descriptors of a long-running program."""
         process = self.residents[name]
         if process.poll() is not None:
             raise Fault(f"{name} has ended with {process.returncode}")
@@ -184,7 +184,7 @@ class Device:
 
 
 class Recorder:
-    """The program of recorder.c. What it was told is recorded when a call returns."""
+    """The program of recorder.c. A call returns once its values are recorded."""
 
     def __init__(self, device, name, program):
         self.process = device.start(name, program)
@@ -215,7 +215,7 @@ class Statsd:
 
 
 class Sampler:
-    """`tavrelctl stat collect`, which takes a reading when it is asked to."""
+    """`tavrelctl stat collect`, which takes a reading on request."""
 
     def __init__(self, device):
         self.clock = device.clock

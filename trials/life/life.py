@@ -1,4 +1,4 @@
-"""A life of a device, day by day: what happens to it, and whether it keeps its promises."""
+"""The life of a device, day by day: what happens to it, and whether it keeps its promises."""
 
 import collections
 import copy
@@ -22,7 +22,7 @@ CLOSE = 1e-9  # relative; sums of doubles depend on their order
 
 
 def same(found, wanted):
-    """Equal, but for the rounding of means and deviations."""
+    """Whether both are equal, apart from the rounding of means and deviations."""
     if isinstance(wanted, dict):
         return isinstance(found, dict) and found.keys() == wanted.keys() and all(
             same(found[key], wanted[key]) for key in wanted)
@@ -55,9 +55,9 @@ class Life:
         self.limits = {"Store": 90, "Pending": 60, "Outbox": 60}
         self.limits_are_whole = True
         self.counts = {}
-        self.number = 0  # of memory errors
+        self.number = 0  # the number of memory errors
         self.updates = 0
-        self.scalar_keys = set()  # of stores that were damaged later
+        self.scalar_keys = set()  # keys in stores that were damaged later
         self.begin()
 
     def count(self, what, number=1):
@@ -91,14 +91,14 @@ class Life:
         recorder.tell(lines)
 
     def activity(self, count=None):
-        """Some minutes in which all that records does so."""
+        """A few minutes in which everything that records does so."""
         count = count or self.chance.randrange(1, 12)
         self.record(self.recorder, {
             "a": [f"com.example.s{i}" for i in range(4)], "s": ["com.example.level"],
             "r": [f"com.example.d{i}" for i in range(3)]}, count)
         lines = []
         for _ in range(self.chance.randrange(1, 6)):
-            # While the clock is wrong, a set does not replace what was added a second before.
+            # While the clock is wrong, a set does not replace a value added a second before.
             kinds = [("a", "c", "hits", 7), ("s", "g", "level", 12), ("r", "ms", "wait", 2.5),
                      ("a", "g", "level", 3)][:4 if self.clock.today >= self.build_day else 3]
             kind, letter, name, value = self.chance.choice(kinds)
@@ -118,7 +118,7 @@ class Life:
             self.model.record(self.clock, self.build_day, "r", "com.example.d0", 4.5)
 
     def killed_recorder(self):
-        """A program of the current release that is killed: what it recorded stays."""
+        """Kills a program of the current release: what it recorded must stay."""
         recorder = Recorder(self.device, "killed", self.recorder_program)
         self.record(recorder, {"a": [f"com.example.v{self.updates}.starts"], "s": ["com.example.k"],
                                "r": [f"com.example.v{self.updates}.seconds"]}, 20)
@@ -153,7 +153,7 @@ class Life:
         raise Fault(f"{name}{ending} is missing")
 
     def check_new_logs(self, effects):
-        """Exactly the expected ones, with each value; what was there is there, or was deleted."""
+        """New logs are exactly those expected, with each value; old ones remain or were deleted."""
         waiting, withheld = self.logs()
         new = {name for name in (waiting - self.waiting) | (withheld - self.withheld)}
         tallied = {name for name in new if name.startswith("log-tallied-")}
@@ -195,7 +195,7 @@ class Life:
         return self.device.path(RECORDS) / f"172-{date_text(self.clock.today)}.jsonl"
 
     def before_run(self):
-        """The file of this day may be from a clock that was ahead, and have gone since."""
+        """If a clock that was ahead had made this day's file, it may have been removed since."""
         if not self.records_of_today().exists():
             self.model.records.pop(self.clock.today, None)
 
@@ -204,7 +204,7 @@ class Life:
         text = path.read_text(encoding="ascii") if path.exists() else ""
         found = [json.loads(line)["record"] for line in text.splitlines()]
         wanted = self.model.records.get(day, [])
-        if disturbed:  # one that was filed before a kill may be filed again
+        if disturbed:  # a record filed before a kill may be filed again
             expect(all(record in found for record in wanted), f"{path.name} lacks records")
             self.model.records[day] = found
         else:
@@ -230,9 +230,9 @@ class Life:
         self.check_records(disturbed)
 
     def disturbed_run(self, disturb):
-        """A run that something befalls, and the next one, which makes up for it. A log may lack
-        something only when the run says so; it is then filed again by hand. False when no run was
-        due."""
+        """A disturbed run, and the next one, which makes up for it. A log may lack
+        something only if the run reports that; it is then filed again by hand.
+        False when no run was due."""
         self.before_run()
         before = copy.deepcopy(self.model, {id(self.model.ever): self.model.ever})
         effects = self.model.gated(self.clock, self.build_day)
@@ -256,7 +256,7 @@ class Life:
             again = self.model.gated(self.clock, self.build_day)
             self.device.run("tavrel", "-d")
         elif is_filed:
-            self.fold()  # which takes in what could not be committed
+            self.fold()  # this takes in values that could not be committed
             return True
         else:
             expect(said, f"no log of day {effects['day']}, and nobody says why")
@@ -270,7 +270,7 @@ class Life:
 
     def adopt(self, before):
         """Takes over the state that a disturbed run has left: each preference has its old or its
-        new value. Tells whether the day counts as done."""
+        new value. Returns whether the day counts as done."""
         model, found = self.model, self.device.preferences(OWN)
         for key in {**found, **before.own, **model.own}:
             allowed = [before.own.get(key), model.own.get(key)]
@@ -289,7 +289,7 @@ class Life:
         model.last_nand = int((nand - moment(0)).total_seconds()) if nand else None
         model.corruptions = self.device.preferences("com.norvane.tallied").get(
             "DatabaseCorruptionCount", 0)
-        # What was taken from the queue is filed.
+        # Events taken from the queue must have been filed.
         waiting = {int(path.stem) for path in self.device.path(EVENTS).glob("*.event")}
         todays = model.records.get(self.clock.today, [])
         model.events = [event for event in todays if event["reg0"] in waiting]
@@ -303,7 +303,7 @@ class Life:
                        for day, in self.device.rows(f"SELECT DISTINCT day FROM {table}")})
 
     def excess_days(self, days):
-        """Those that the limit removes: recorded while the clock was ahead, then the oldest."""
+        """The days to remove: first those recorded while the clock was ahead, then the oldest."""
         today, last = self.clock.today, self.model.own.get(LAST_RUN)
         waits = {today, today - 1} | ({last + 1, last + 2} if last is not None else set())
         waits -= {day for day in days if last is not None and day <= last and day != today}
@@ -325,7 +325,7 @@ class Life:
         return set(excess)
 
     def set_aside(self):
-        """Files that were damaged, and their KiB."""
+        """The number of damaged files that were set aside, and their KiB."""
         found = [path for folder in (STORE_FOLDER, PREFERENCES)
                  for path in self.device.path(folder).glob("*") if SET_ASIDE.search(path.name)]
         return len(found), sum((path.stat().st_size + 4095) // 4096 * 4 for path in found)
@@ -361,8 +361,8 @@ class Life:
     # -- All that is held ---------------------------------------------------------------------
 
     def check_statistics(self):
-        """Each value of the store and of what waits, with its second. Values that wait for a date
-        are not exported."""
+        """Checks each value in the store and each waiting one, with its second. Values that still
+        wait for a date are not exported."""
         twin = Model()
         twin.stored, twin.waiting = self.model.stored.copy(), list(self.model.waiting)
         twin.fold(self.clock, self.build_day)
@@ -379,10 +379,10 @@ class Life:
                 if line.split("\t")[2].startswith(TRACKED)]
 
     def check_new_store(self, waited):
-        """Of a damaged store comes back what programs still have in memory: whole what a program
-        has left that was killed, and the measurements that no fold had taken. A scalar of a program
-        that lives on may be lost, but does not come back with a value that was not set, or with
-        more than was added. For each such key one value may be refused."""
+        """After damage, the store regains what programs still have in memory: everything that a
+        killed program left, and the measurements that no fold had taken. A scalar of a running
+        program may be lost, but must not return with a value that was not set, or with more than
+        was added. One value may be refused for each such key."""
         ever, found = self.model.ever, Statistics()
         for line in self.exported():
             kind, day, key, *numbers = line.split("\t")

@@ -1,5 +1,5 @@
-"""What befalls a device in its life. Each function is one event, which returns False when nothing
-could befall it; the names count in the summary."""
+"""Mishaps in a device's life. Each function is one event and returns False when it could not
+happen; their names appear in the summary."""
 
 import os
 
@@ -16,11 +16,11 @@ JUNK_FILES = ["var/lib/tavrel/last-run.plist", "run/tavrel/collect.state",
 
 
 class Mishaps(Life):
-    """How often a thousand days have each event is in EVENTS."""
+    """EVENTS says how often each event happens in a thousand days."""
 
     repair_clock_at = None
     uploads = True
-    spoiled = ()  # files that somebody repairs the next time
+    spoiled = ()  # files that will be repaired next time
 
     # -- The owner, and those who look after the device -----------------------------------------
 
@@ -107,7 +107,7 @@ class Mishaps(Life):
         self.uploads = not self.uploads
 
     def upload(self):
-        """As the uploader does once the server has confirmed a log: the log goes first."""
+        """Acts as the uploader does on a confirmed log: removes the log first."""
         for place in ("pending", "outbox"):
             for name in self.device.logs()[place]:
                 for ending in (".log", ".metadata.plist"):
@@ -154,7 +154,7 @@ class Mishaps(Life):
     def repair_clock(self):
         self.clock.set_wrong(0)
         self.repair_clock_at = None
-        # No run comes before the clock has passed the last one. Somebody who sees that helps.
+        # No run comes until the clock has passed the last one. Somebody notices and helps.
         if self.model.own.get(LAST_RUN, 0) > self.clock.today + 2:
             self.model.own[LAST_RUN] = self.clock.today - 2
             self.device.tool("prefs", "set", OWN, LAST_RUN, str(self.clock.today - 2), "--int")
@@ -163,7 +163,7 @@ class Mishaps(Life):
     # -- Faults -----------------------------------------------------------------------------------
 
     def kill(self, *command):
-        """Kills a program before one of the calls that change files."""
+        """Kills a program before one of its calls that change files."""
         return self.device.run(*command, kill_at=self.chance.randrange(
             1, {"tavrel": 120}.get(command[0], 12)))
 
@@ -176,7 +176,7 @@ class Mishaps(Life):
         self.fold()
 
     def full_disk(self):
-        """Programs record and fold, and the daily run comes, while there is hardly any room."""
+        """Programs record and fold, and the daily run comes, while there is hardly any space."""
         if not os.path.ismount(self.device.path("var")):
             return False
         room = self.chance.choice([0, 4, 16, 36, 60, 80, 110, 150, 400])
@@ -202,7 +202,7 @@ class Mishaps(Life):
 
     def corrupt_store(self):
         self.fold()
-        # Values without a date, which memory may still have, would be dated by a wrong clock.
+        # Memory may still have undated values, which a wrong clock would date.
         if self.clock.wrong:
             return False
         self.scalar_keys.update(self.device.rows("SELECT DISTINCT key FROM scalars"))
@@ -240,7 +240,7 @@ class Mishaps(Life):
         self.device.path(name).unlink()
 
     def torn_record(self):
-        """The end of a record that a power cut has left."""
+        """Leaves the torn end of a record, as a power cut would."""
         if not self.records_of_today().exists():
             return False
         with open(self.records_of_today(), "ab") as file:
@@ -249,7 +249,7 @@ class Mishaps(Life):
         return True
 
 
-# Per thousand days.
+# Occurrences per thousand days.
 EVENTS = {
     "deny": 10, "update_system": 14, "update_whitelist": 10, "spoil_whitelist": 8,
     "tasking": 20, "clear_tasking": 5, "change_limits": 6, "spoil_limits": 5, "server_away": 15,

@@ -1,4 +1,4 @@
-"""What a device must hold and report, computed from what was done to it and from docs/ alone."""
+"""What a device must hold and report, computed only from what was done to it and from docs/."""
 
 import bisect
 import datetime
@@ -13,9 +13,9 @@ DA = "com.norvane.da"
 OTHER = "com.example.settings"  # a domain of another program
 CAPACITY = 32 << 30
 NAND_PERIOD = 7 * SECONDS_PER_DAY
-REPORTED = ("reported", "filed by hand")  # fates that a further run does not change
-LANGUAGES = b"en\nde\nzh-Hant\n"  # that the device shows
-LOCALES = [  # /etc/locale.conf, and what a log says of it
+REPORTED = ("reported", "filed by hand")  # fates that another run does not change
+LANGUAGES = b"en\nde\nzh-Hant\n"  # the languages that the device shows
+LOCALES = [  # /etc/locale.conf, and what a log says about it
     (b"", {"BHUserInterfaceLanguage": "<unknown>",
            "BHPreferredUserInterfaceLanguage": "<unknown>"}),
     (b"LANG=de_AT.UTF-8\nLC_MEASUREMENT=de_CH.UTF-8\nLANGUAGE=de_AT:de:en\n",
@@ -63,7 +63,7 @@ def summary(values):
 
 
 class Statistics:
-    """Scalars by day and key, and the seconds and values of series."""
+    """Scalars by day and key; the seconds and values of series."""
 
     def __init__(self):
         self.scalars, self.series = {}, {}
@@ -85,7 +85,7 @@ class Statistics:
                     del table[day]
 
     def lines(self):
-        """As `tavrelctl stat export` prints them."""
+        """The lines that `tavrelctl stat export` prints."""
         return [f"scalar\t{day}\t{key}\t{value}" for day, row in self.scalars.items()
                 for key, value in row.items()] + [
                     f"value\t{day}\t{key}\t{second}\t{value:.17g}"
@@ -103,7 +103,7 @@ class Statistics:
 class Model:
     def __init__(self):
         self.stored, self.waiting = Statistics(), []
-        self.ever = Statistics()  # whatever became of it
+        self.ever = Statistics()  # everything recorded, whatever became of it
         self.whitelist, self.whitelist_bytes = None, b""
         self.permitted, self.first_day = False, None
         self.version, self.locale = {}, {}
@@ -112,14 +112,14 @@ class Model:
         self.scheduled = None
         self.corruptions = 0
         self.last_nand = None
-        self.events, self.records = [], {}  # memory errors that wait, and that are filed by day
+        self.events, self.records = [], {}  # memory errors that wait, and those filed, by day
         self.fates = {}                     # what became of each day
 
     # -- Recording -----------------------------------------------------------------------------
 
     def record(self, clock, build_day, kind, key, value):
-        """The day is that of the clock or, when it is before the library was built, that which
-        the time since boot gives once the clock is set."""
+        """The day is that of the clock. When that is before the library was built, it follows from
+        the time since boot once the clock is set."""
         dated = clock.today >= build_day
         self.waiting.append((clock.now if dated else None, clock.uptime, kind, key, value))
 
@@ -141,7 +141,7 @@ class Model:
         return self.permitted and (self.first_day is None or day >= self.first_day)
 
     def options(self, table, key):
-        """Of the whitelist; None when the key does not leave the device."""
+        """The whitelist's options; None when the key does not leave the device."""
         found = None
         for group, tables in self.whitelist.items():
             if self.domains[DA].get(group) is False:
@@ -154,7 +154,7 @@ class Model:
         return None if found is None else found[1]
 
     def log(self, day, clock):
-        """The content of the day's log, or why there is none."""
+        """The content of the day's log, or the reason why there is none."""
         if not self.covers(clock.today - 1):
             return "not-permitted"
         if self.whitelist is None:
@@ -190,7 +190,7 @@ class Model:
         return "{ProductName} {ProductVersion} ({ProductBuildVersion})".format(**self.version)
 
     def metadata(self, clock):
-        """Of a log that is filed now; notes the version of the system."""
+        """Metadata of a log that is filed now; notes the version of the system."""
         found = {"LogType": "193", "LogName": "log-tallied", "OSVersion": self.version_text(),
                  "Time": moment(clock.now)}
         last = self.own.get("LastOSVersion")
@@ -200,14 +200,14 @@ class Model:
         return found
 
     def note_fate(self, day, fate, clock):
-        """Of a day that is over; what a clock that is ahead does for a day to come is not its
-        fate."""
+        """Notes the fate of a day that is over; what a clock that is ahead does for a
+        future day is not its fate."""
         if day < clock.true // SECONDS_PER_DAY:
             self.fates[day] = fate
 
     def gated(self, clock, build_day):
-        """What a daily run does: the line about days without a run, and the effects of the tasks;
-        None when the gate is shut."""
+        """Performs a daily run: returns the line about days without a run, and the effects of the
+        tasks; None when the gate is closed."""
         day = clock.today - 1
         last = self.own.get(LAST_RUN)
         if (last or 0) >= day:

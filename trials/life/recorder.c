@@ -1,4 +1,4 @@
-/* A program that records for all of a simulated life. Each line of standard input is a command:
+/* Records for the whole of a simulated life. Each line of standard input is a command:
  *   a KEY N   adds to a scalar        s KEY N   sets it
  *   r KEY X   records a value         .         answers with a line
  */

@@ -1,12 +1,12 @@
 /* Preloaded into programs that live a simulated life. The clocks show what a file says, which the
- * driver maps too. The real-time clock and the one since boot stand still between two strokes, so
- * that each date is known; the monotonic clock goes on, so that deadlines pass.
+ * driver maps as well. The real-time clock and the time since boot stand still between two strokes,
+ * so that each date is known; the monotonic clock keeps going, so that deadlines pass.
  *
  *   LIFE_CLOCK    the file, struct Shared
- *   LIFE_KILL_AT  the number of the call that changes files before which the process is killed
+ *   LIFE_KILL_AT  the process is killed before this call, counting calls that change files
  *   LIFE_PACED    waits for a signal last until the driver has asked for one more stroke
  *
- * When the program ends, its peak memory and how many such calls it made are in the file. */
+ * When the program ends, the file has its peak memory and the number of such calls. */
 #define _GNU_SOURCE
 #include <dlfcn.h>
 #include <errno.h>
@@ -61,7 +61,7 @@ __attribute__((constructor)) static void beginEarly(void) {
   begin();
 }
 
-/* The kernel's account of a process counts the memory of the one that started it, too; this does
+/* In the kernel's account, a process's peak memory includes that of its parent; this figure does
  * not. */
 __attribute__((destructor)) static void leaveFigures(void) {
   atomic_store(&shared->calls, calls);
@@ -121,7 +121,7 @@ time_t time(time_t* result) {
   return now.tv_sec;
 }
 
-/* A stroke is done once the program waits for the next one. */
+/* A stroke is complete once the program waits for the next one. */
 int sigtimedwait(const sigset_t* restrict set, siginfo_t* restrict info,
                  const struct timespec* restrict timeout) {
   NEXT(sigtimedwait);

@@ -1,4 +1,4 @@
-"""Lives through the days, accounts for each, and watches what grows."""
+"""Lives through the days, accounts for each, and watches whether anything grows."""
 
 import os
 
@@ -6,18 +6,18 @@ from device import RECORDS, SECONDS_PER_DAY, STORE
 from life import expect
 from mishaps import EVENTS, Mishaps
 
-MOST = {  # of what is held at the end of a year; the limits of docs/limits.md
+MOST = {  # the maximum at the end of a year; the limits of docs/limits.md
     "store KiB": (12 + 2 + 1) << 10, "days": 94, "positions": 64, "logs": 600, "withheld": 8,
     "records": 64, "aside KiB": 16 << 10, "run KiB": 16 << 10, "left over": 8, "disk KiB": 58 << 10}
 MEMORY = ["tavrel", "tavrelctl stat fold", "tavrelctl tidy", "recorder", "tavrel-statsd",
-          "stat collect"]  # the peaks of those that end, and what those have that live on
-FLAT = 1.1          # a last year may have so much more than the first
+          "stat collect"]  # the peaks of those that end, and the sizes of those that live on
+FLAT = 1.1          # by this factor, the last year may exceed the first
 FLAT_KIBIBYTES = 512
-WARM_UP = 60        # days until the programs that live on have seen what there is to see
+WARM_UP = 60        # days after which long-running programs have seen everything once
 
 
 class Years(Mishaps):
-    history = {}  # what befell the device on each day
+    history = {}  # the events of each day
 
     def live(self, days, is_memory_flat):
         self.is_memory_flat = is_memory_flat
@@ -85,14 +85,14 @@ class Years(Mishaps):
             file.write(b"a line\n")
 
     def age_leftovers(self):
-        """The kernel dates files with the machine's clock: what a killed program left is a day
-        older each day."""
+        """Ages files that killed programs left by a day. The kernel dates them with the machine's
+        clock, not the device's."""
         for path in self.device.path("var").rglob(".tavrel-*.tmp"):
             status = path.stat()
             os.utime(path, (status.st_atime, status.st_mtime - SECONDS_PER_DAY))
 
     def lately(self, day):
-        """For a report: the day and those before it."""
+        """For a report: the day and its neighbours."""
         return [(each, self.history.get(each)) for each in range(day - 6, day + 3)]
 
     # -- What grows ---------------------------------------------------------------------------
@@ -140,7 +140,7 @@ class Years(Mishaps):
         expect(descriptors == first_descriptors, f"descriptors: {first_descriptors}, {descriptors}")
         for name, number in memory.items() if self.is_memory_flat else ():
             before = first_memory[name]
-            if name not in self.device.residents:  # a peak, which depends on what happens in a year
+            if name not in self.device.residents:  # a peak, which depends on the events of a year
                 before = max(early[name] for _, early, _ in self.figures[:2])
             expect(number <= before * FLAT + FLAT_KIBIBYTES,
                    f"{name} had {before} KiB and has {number}")
@@ -163,7 +163,7 @@ class Years(Mishaps):
             print(f"{number:9} kills of {name}")
 
     def reason(self, day, last):
-        """Why a day that is not reported had no run."""
+        """Why there was no run for a day that is not reported."""
         if {day, day + 1} & self.off:
             return "no run: the device was off"
         if {day, day + 1} & self.wrong:

@@ -1,6 +1,6 @@
 /* Uses all of libbrimhold from four threads, and again from a child. Built with MemorySanitizer, it
- * ends at the first use of memory that nothing was written to. Ends with 1 when something else than
- * expected is said of the recording. Link with -Wl,--wrap=syscall. */
+ * ends at the first use of uninitialised memory. Exits with 1 when recording reports an unexpected
+ * status. Link with -Wl,--wrap=syscall. */
 #include <brimhold/client.h>
 #include <pthread.h>
 #include <stdarg.h>
@@ -12,7 +12,7 @@
 
 enum { kThreads = 4, kValues = 20000, kKeys = 300, kLongest = 1100, kArguments = 5 };
 
-/* GCC, which analyses this file, has no header of it. */
+/* GCC, which analyses this file, has no header that declares it. */
 void __msan_unpoison(const volatile void* address, size_t bytes);
 long __real_syscall(long number, ...);
 long __wrap_syscall(long number, ...);
@@ -32,7 +32,7 @@ long __wrap_syscall(long number, ...) {
   return result;
 }
 
-/* Keys of all lengths, some of them longer than the library takes. */
+/* Keys of all lengths, including some longer than the library accepts. */
 static void* record(void* thread) {
   char key[kLongest + 16];
   for (int i = 0; i < kValues; ++i) {
