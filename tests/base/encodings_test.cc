@@ -36,7 +36,7 @@ TEST(Dates, AreReadAsTheyAreWritten) {
     EXPECT_FALSE(parseIsoDate(text)) << text;
 }
 
-// Values of an implementation that agrees with Python's hash of bytes.
+// Values from an implementation that agrees with Python's hash of bytes.
 TEST(Hash, IsSipHash) {
   const HashKey key{0x0706050403020100, 0x0F0E0D0C0B0A0908};
   EXPECT_EQ(sipHash("", key), 0xABAC0158050FC4DC);

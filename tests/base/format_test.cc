@@ -25,7 +25,7 @@ std::string printed(std::string_view format, const std::vector<FormatArgument>& 
   return status ? out : "error: " + status.error().message;
 }
 
-// Compares with the C library over every combination of flags, some widths and precisions.
+// Compares with the C library for every combination of flags, with some widths and precisions.
 template <class Argument>
 void compare(const std::vector<std::string>& conversions, const std::vector<Argument>& values) {
   for (unsigned flags = 0; flags < 32; ++flags) {
@@ -134,7 +134,7 @@ TEST(Format, RefusesForeignTextsThatDoNotFitTheirArguments) {
   EXPECT_EQ(printed("%u%%", {1, 2, 3}), "error: the format uses 1 of its 3 arguments");
 }
 
-// What keeps a wrong literal from being compiled.
+// The check that prevents a wrong literal from compiling.
 constexpr FormatFault faultWith(std::string_view text, std::initializer_list<ArgumentType> types) {
   return checkFormat(text, {types.begin(), types.size()});
 }

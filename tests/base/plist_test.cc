@@ -127,7 +127,7 @@ TEST(Value, AssignmentOfItselfAndOfItsOwnPartIsSafe) {
   EXPECT_TRUE(names.empty());
 }
 
-// The index begins beyond eight entries: random changes are compared with a plain list of keys.
+// Beyond eight entries there is an index, so compare random changes with a plain list of keys.
 TEST(Dictionary, KeepsOrderAndContentThroughManyChanges) {
   std::mt19937 random(7);
   for (const unsigned keyCount : {4U, 9U, 20U, 500U}) {

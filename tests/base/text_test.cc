@@ -107,7 +107,7 @@ TEST(CivilTime, EveryInstantOf64BitsHasFields) {
 }
 
 TEST(Utf8, TellsWellFormedFromMalformed) {
-  // Over-long twice, a surrogate, beyond U+10FFFF, cut.
+  // Two overlong forms, a surrogate, a truncated one, beyond U+10FFFF.
   using Case = std::pair<std::string_view, std::string_view>;
   for (const auto& [text, repaired] :
        {Case("\xC0\xAF", "\uFFFD\uFFFD"), Case("\xE0\x9F\xBF", "\uFFFD\uFFFD\uFFFD"),

@@ -16,7 +16,7 @@ namespace {
 constexpr int kThreads = 8;
 constexpr int kPerThread = 40'000;
 
-// All numbers from 0 up, each once, except for as many as were dropped.
+// All numbers from 0 up, each once, except as many as were dropped.
 void expectEachOnce(std::vector<double> values, std::uint64_t expected, std::uint64_t dropped) {
   EXPECT_EQ(values.size() + dropped, expected);
   std::sort(values.begin(), values.end());
@@ -28,7 +28,7 @@ void expectEachOnce(std::vector<double> values, std::uint64_t expected, std::uin
 TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   const pid_t child = start([] {
     keys();
-    // All begin a segment at once, and name their first key in it at once.
+    // All threads begin a segment at the same time, and then name their first key in it.
     std::barrier together(kThreads);
     whileFetching = [&] {
       thread_local int fetches = 0;
@@ -59,7 +59,7 @@ TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
 TEST_F(Recording, AKilledProgramLeavesEverythingItRecorded) {
   auto& progress = shared<std::atomic<int>>();
   std::mt19937 random(12);
-  const char* const rounds = std::getenv("TAVREL_KILL_ROUNDS");  // for long runs by hand
+  const char* const rounds = std::getenv("TAVREL_KILL_ROUNDS");  // set for long manual runs
   for (long round = rounds ? std::strtol(rounds, nullptr, 10) : 200; round > 0; --round) {
     SCOPED_TRACE(round);
     progress = 0;
@@ -99,10 +99,10 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
     add(1);
     record(1);
     const Gate recorded, left;
-    // No handlers of the library run here, as with clone: the first value has to let go.
+    // As after clone, no handlers of the library run here: the first value must detach the child.
     if (_Fork() == 0) {
       if (_Fork() == 0) {
-        // The middle process is a parent that ends first, as of a daemon.
+        // The middle process is a parent that ends first, like that of a daemon.
         left.wait();
         add(10);
         record(2);
@@ -146,7 +146,7 @@ TEST_F(Recording, AChildWithoutValuesHoldsNoSegment) {
 
 TEST_F(Recording, AChildMadeWithinACallRecordsForItself) {
   auto& done = shared<std::atomic<int>>();
-  // Calls, and how often each fetches memory. The first time is for the segment, when signals wait.
+  // Calls, and how often each allocates. The first time is for the segment, when signals wait.
   const std::pair<void (*)(), int> cases[] = {{[] { add(1); }, 4}, {[] { record(1); }, 7}};
   for (const auto& [call, fetches] : cases) {
     for (int at = 2; at <= fetches; ++at) {
@@ -157,7 +157,7 @@ TEST_F(Recording, AChildMadeWithinACallRecordsForItself) {
         int left = at;
         pid_t child = -1;
         int own = 0;
-        // As a signal handler might. What it interrupts is recorded in the parent alone.
+        // As in a signal handler. The call that it interrupts is recorded only in the parent.
         whileFetching = [&] {
           if (--left == 0) child = fork();
           if (left == 0 && child == 0) own = -1;
@@ -189,7 +189,7 @@ TEST_F(Recording, EachValueBelongsToTheDayThatTheClockShows) {
       record(static_cast<double>(now));
     }
     kill(getpid(), SIGSTOP);
-    // The cells of the days that are over have been folded, and serve other days.
+    // The cells of past days have been folded and now serve other days.
     for (const std::int64_t day : {1, 2, 1, 7}) {
       testClock().realtime = midnight + day * 86'400;
       add(100);
@@ -227,7 +227,7 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
   boot = std::nullopt;
   fold();
   EXPECT_EQ(scalar("count"), 1000);
-  EXPECT_TRUE(records.empty());  // in their order
+  EXPECT_TRUE(records.empty());  // in order
   EXPECT_EQ(segments().size(), 1U);
 
   boot = kToday * 86'400 - 100;
@@ -249,7 +249,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   const pid_t child = start([&] {
     const auto isFoldWanted = [&] { return std::filesystem::exists(folder / "fold-wanted"); };
     int i = 0;
-    // Signal handlers, one within the other, record while the second chunk is taken.
+    // Nested signal handlers record while the second chunk is being taken.
     int handlers = 2;
     whileFetching = [&] {
       if (i > kBHChunkRecords && handlers-- > 0) record(i++);
@@ -260,7 +260,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
     std::filesystem::remove(folder / "fold-wanted");
     for (; i < kRoom + 7; ++i)
       record(i);
-    EXPECT_FALSE(isFoldWanted());  // once
+    EXPECT_FALSE(isFoldWanted());  // only once
     const char* text = nullptr;
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusFull);
     EXPECT_STREQ(text, "the segment is full: values are dropped until the next fold");
@@ -327,7 +327,7 @@ TEST_F(Recording, SignalHandlersRecord) {
   int& recorded = shared<int>();
   run([&] {
     keys();
-    // The first value of the process may be a handler's, in the middle of another first value.
+    // The first value of the process may come from a handler, in the middle of another first value.
     std::signal(SIGALRM, [](int) {
       for (int i = 0; i < 3; ++i)
         record(handled++);
@@ -491,7 +491,7 @@ TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
 }
 
 TEST_F(Recording, TheSharedLibraryStaysWhenItIsClosed) {
-  testClock().realtime = 0;  // as the library sees it
+  testClock().realtime = 0;  // the library sees the real clock
   run([] {
     void* const library = dlopen(TAVREL_BUILD "/client/libbrimhold.so.1", RTLD_NOW | RTLD_LOCAL);
     ASSERT_NE(library, nullptr) << dlerror();
@@ -502,7 +502,7 @@ TEST_F(Recording, TheSharedLibraryStaysWhenItIsClosed) {
     BHClientDistributionKey* const key = keyFor("closed");
     std::atomic<int> step = 0;
     std::thread other([&] {
-      recordInto(key, 1);  // has memory of its own in the library
+      recordInto(key, 1);  // has its own memory in the library
       step = 1;
       while (step != 2)
         sched_yield();

@@ -1,4 +1,4 @@
-// What a fold refuses, bounds, or leaves for the next one.
+// What a fold refuses, limits, or leaves for the next fold.
 
 #include <algorithm>
 #include <array>
@@ -32,7 +32,7 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
       {recorders, 0644, 15, {"x"}, 3},
       {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
       {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
-      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},  // a link that leads nowhere
+      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},  // a dangling link
   };
   for (const auto& [content, mode, user, allowed, lines] : cases) {
     SCOPED_TRACE(user);
@@ -110,7 +110,7 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   EXPECT_EQ(log.lines.size(), 1U);
   EXPECT_NE(log.lines.at(0).find("\"fold-wanted-"), std::string::npos) << log.lines.at(0);
   EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
-  report = foldNow();  // the copy is now alone and folded, as if it had been recorded
+  report = foldNow();  // the copy is now alone, and folded as if it had been recorded
   EXPECT_EQ(report.segmentsRefused, 0U);
   EXPECT_EQ(log.lines, Lines());
   look();
@@ -119,10 +119,10 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   for (int i = 0; i < 200; ++i)
     put(std::to_string(i).c_str(), 0);
   EXPECT_EQ(foldNow().segmentsRefused, 200U);
-  EXPECT_EQ(log.lines.size(), 100U - 8 + 1);  // with those of the folds before
+  EXPECT_EQ(log.lines.size(), 100U - 8 + 1);  // with those of the earlier folds
   EXPECT_EQ(log.lines.back(), "108 more refusals of this fold are not listed");
 
-  // Once others have taken all room to remember them, they count each time.
+  // Once others have used up the room for remembering refusals, these count every time.
   std::ofstream told(root / "run/tavrel/fold.lock");
   for (std::uint64_t i = 0; i < 8192; ++i)
     told.write(reinterpret_cast<const char*>(&i), sizeof i);
@@ -207,7 +207,7 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   kill(child, SIGKILL);
   waitFor(child);
 
-  // A segment that cannot be read now keeps its position.
+  // A segment that is temporarily unreadable keeps its position.
   const std::string segment = segments().at(0);
   std::filesystem::create_hard_link(segment, root / "copy");
   EXPECT_EQ(foldNow().segmentsRefused, 1U);
@@ -224,7 +224,7 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   }
   EXPECT_EQ(foldNow().removed, 1U);
 
-  // One that was folded to its end is not read again.
+  // A segment that was folded to its end is not read again.
   run([] { add(1); });
   const std::string ended = segments().at(0);
   std::filesystem::copy_file(ended, root / "copy");
@@ -280,7 +280,7 @@ TEST_F(FoldTest, AStoreFarBeyondItsLimitTakesNothingFromUsers) {
   };
   for (int i = 0; i < 4; ++i)
     recordAs(12);
-  for (int fold = 0; fold < 2; ++fold) {  // two, of 0.7 MB each, reach 1.25 MiB
+  for (int fold = 0; fold < 2; ++fold) {  // two of 0.7 MB each exceed 1.25 MiB
     EXPECT_EQ(foldNow().waiting, 2U);
     EXPECT_EQ(log.lines.size(), fold == 0 ? 1U : 0U);
   }
@@ -298,7 +298,7 @@ TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
   SegmentFile(Descriptor(open(segments().at(0).c_str(), O_RDONLY | O_CLOEXEC)).get()).read(0, head);
   std::filesystem::remove(segments().at(0));
   const std::uint32_t cellsUsed = kBHCellCount;
-  // Cells that an earlier store took: nothing but their position is new.
+  // Cells that an earlier store took: only their position is new.
   std::string cells(std::size_t{kBHCellCount} * kBHCellBytes, '\1');
   std::vector<Descriptor> writers;
   for (std::uint64_t number = 1; number <= 9; ++number) {

@@ -151,7 +151,7 @@ TEST_F(FoldTest, EachDayKeepsWhatItsClockSaw) {
   EXPECT_EQ(records["series"].size(), 10U);
 }
 
-// The process gives cells another day once they are folded. The store that knew how far is lost.
+// Folded cells are reused for another day. The store that knew how far folding had come is lost.
 TEST_F(FoldTest, ALostStoreMakesNoDayOfEarlierOnes) {
   constexpr int kDays = 6;
   const pid_t child = start([&] {
@@ -281,7 +281,7 @@ TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
         .value_or("");
   };
   EXPECT_EQ(warning(), "");
-  testClock().whenRead = [] {  // as a fold does
+  testClock().whenRead = [] {  // touch the mark as a fold does
     static timespec times[2];
     ++times[1].tv_sec;
     utimensat(AT_FDCWD, (getenv("TAVREL_ROOT") + std::string("/run/tavrel/fold.lock")).c_str(),
@@ -292,7 +292,7 @@ TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
             "again");
   testClock().whenRead = nullptr;
   openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
-      .execute("UPDATE segments SET position = x'63000000'");  // of another version
+      .execute("UPDATE segments SET position = x'63000000'");  // from another version
   EXPECT_EQ(warning(), "1 segments with values that wait are not shown: run 'tavrelctl stat fold'");
   kill(child, SIGKILL);
   waitFor(child);
@@ -327,7 +327,7 @@ TEST_F(FoldTest, ASeriesThatWaitsIsReadToItsEndOrFails) {
   ASSERT_FALSE(walked);
   EXPECT_EQ(walked.error().message, "cannot read the copy of segments: Input/output error");
 
-  // The kernel writes what the limit leaves room for.
+  // The kernel writes only what the limit leaves room for.
   signal(SIGXFSZ, SIG_IGN);
   rlimit sizes{};
   getrlimit(RLIMIT_FSIZE, &sizes);
@@ -362,11 +362,11 @@ TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
     run([&] { add(amount); });
   EXPECT_EQ(foldNow().refused, 1U);
   look();
-  EXPECT_EQ(scalar("count"), 3);  // the largest amount did not fit behind the first
+  EXPECT_EQ(scalar("count"), 3);  // the largest amount did not fit on top of the first
   run([] { add(INT64_MAX); });
   EXPECT_EQ(foldNow().refused, 1U);
   look();
-  EXPECT_EQ(scalar("count"), 3);  // nor what the store held
+  EXPECT_EQ(scalar("count"), 3);  // nor on top of what the store held
 }
 
 TEST_F(FoldTest, ASetKeepsWhatTheFoldAddedBefore) {
@@ -432,7 +432,7 @@ TEST_F(FoldTest, AStoreDamagedWhereOnlyFoldsLookIsSetAside) {
     std::int64_t page =
         open.integer(format("SELECT rootpage FROM sqlite_schema WHERE name = '%s'", damaged));
     if (page == 0) {
-      file.seekg(34);  // the lower half of its first page
+      file.seekg(34);  // the low half of its first page's number
       page = file.get() * 256 + file.get();
     }
     ASSERT_GT(page, 1);

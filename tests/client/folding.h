@@ -18,11 +18,11 @@ namespace tavrel {
 using Lines = std::vector<std::string>;
 
 inline int fromEnvironment(const char* name, int otherwise) {
-  const char* const text = std::getenv(name);  // for long runs by hand
+  const char* const text = std::getenv(name);  // set for long manual runs
   return text ? static_cast<int>(std::strtol(text, nullptr, 10)) : otherwise;
 }
 
-/// Folds into the store of the device, and looks at what it holds.
+/// Folds into the device's store, and reads what it holds.
 class FoldTest : public Recording {
  protected:
   struct KeptLog final : SystemLog {
@@ -44,7 +44,7 @@ class FoldTest : public Recording {
                        device.platform().propertyLists, log)
         .run();
   }
-  /// What the store holds, and what waits too if wanted.
+  /// Reads what the store holds and, if wanted, what is still waiting.
   void look(bool alsoWaiting = false) {
     scalars.clear();
     records.clear();
@@ -77,7 +77,7 @@ class FoldTest : public Recording {
   }
   std::int64_t figure(const char* name) {
     const std::string key = std::string("com.norvane.brimhold.") + name;
-    std::int64_t sum = 0;  // under the day of the machine's clock
+    std::int64_t sum = 0;  // dated by the machine's clock
     for (const auto& [row, value] : scalars)
       if (row.first == key) sum += value;
     return sum;

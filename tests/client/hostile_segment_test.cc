@@ -1,4 +1,4 @@
-// Segments that no honest program would leave.
+// Segments that no well-behaved program would leave.
 
 #include <random>
 #include <thread>
@@ -30,7 +30,7 @@ class HostileSegment : public Recording {
     EXPECT_EQ(pwrite(file_.get(), original_.data(), original_.size(), 0), 0xd0000);
   }
 
-  /// The error, or what was read: "SCALARS RECORDS REFUSED".
+  /// Returns the error, or what was read: "SCALARS RECORDS REFUSED".
   std::string readAll(bool writerIsGone = true) {
     scalars.clear();
     records.clear();
@@ -97,7 +97,7 @@ TEST_F(HostileSegment, IsRefusedOrSkipped) {
     restore();
   }
   write(kBHChunks + kBHChunkFirst + 8, std::uint64_t{0});
-  EXPECT_EQ(readAll(false), "1 45 0");  // it may still come
+  EXPECT_EQ(readAll(false), "1 45 0");  // the record may still arrive
   EXPECT_EQ(positionBytes, 56U) << "a chunk of which nothing was taken";
   EXPECT_EQ(ftruncate(file_.get(), kBHChunks), 0);
   EXPECT_EQ(readAll(), "a segment of a wrong size");

@@ -91,7 +91,7 @@ SegmentWriter Recording::writerOf(const std::string& segment) const {
 void Recording::fold() {
   for (const std::string& path : segments()) {
     const Descriptor file(open(path.c_str(), O_RDONLY));
-    // Of threads that begin a segment at once, one keeps its own.
+    // When threads begin a segment at the same time, only one keeps its own.
     if (!file && errno == ENOENT) continue;
     SegmentReader reader(file.get());
     const bool isGone = findSegmentWriter(file.get(), reader.facts()) == SegmentWriter::Gone;

@@ -1,4 +1,4 @@
-// Children that record, clocks that the test sets, and a store in memory that folds.
+// Children that record, clocks controlled by the test, and an in-memory store that folds.
 #pragma once
 
 #include <atomic>
@@ -27,8 +27,8 @@ namespace tavrel {
 
 inline constexpr std::int64_t kToday = 25'000;  // a day after any build
 
-/// The seconds that clock_gettime shows here and in children; 0 leaves a clock alone. Each look at
-/// the monotonic one takes ten seconds; it shows a hundredth more than its seconds.
+/// The seconds that clock_gettime shows here and in children; 0 leaves a clock alone. Each read of
+/// the monotonic clock advances it by ten seconds; it shows a hundredth more than its seconds.
 struct TestClock {
   std::atomic<std::int64_t> realtime;
   std::atomic<std::int64_t> boot;
@@ -37,10 +37,10 @@ struct TestClock {
 };
 TestClock& testClock();
 
-/// Called whenever libbrimhold fetches memory.
+/// Called whenever libbrimhold allocates memory.
 extern std::function<void()> whileFetching;
 
-/// Memory whose changes children see.
+/// Memory shared with children: they see changes.
 template <class T>
 T& shared() {
   void* memory =
@@ -48,8 +48,8 @@ T& shared() {
   return *new (memory) T{};
 }
 
-/// Runs `program` in a child, which ends with status 0 unless it was killed, and with this process
-/// at the latest.
+/// Runs `program` in a child, which exits with 0 unless it is killed. The child does
+/// not outlive this process.
 inline pid_t start(const std::function<void()>& program) {
   const pid_t child = fork();
   if (child == 0) {
@@ -68,14 +68,14 @@ inline void run(const std::function<void()>& program) {
   EXPECT_EQ(waitFor(start(program)), 0);
 }
 
-/// What a command of the shell prints, on both streams. It ends with status 0 unless told
-/// otherwise.
+/// What a shell command prints, on both streams. The command must exit with
+/// `status`.
 std::string outputOf(const std::string& command, int status = 0);
 
-/// Before a command of the shell that runs Python: a sanitized library needs its runtime first.
+/// Prefix of shell commands that run Python: a sanitized library needs its runtime first.
 extern const std::string kPython;
 
-/// A pipe on which one process waits until another has closed or written.
+/// A pipe on which one process waits until another has closed it or written to it.
 class Gate {
  public:
   Gate() { EXPECT_EQ(pipe2(ends_, O_CLOEXEC), 0); }
@@ -96,7 +96,7 @@ struct Keys {
   BHClientDistributionKey* series = BHClientDistributionForKey("series");
 };
 
-/// A device whose /run is on a tmpfs, and its store.
+/// A device whose /run is on a tmpfs, with its store.
 class Recording : public testing::Test, public SegmentSink {
  protected:
   Recording();
@@ -112,14 +112,14 @@ class Recording : public testing::Test, public SegmentSink {
     seconds.push_back(record.day * std::int64_t{86'400} + record.secondsInDay);
   }
 
-  /// The keys of the programs, once they are looked up in the process, and values for them.
+  /// The keys of the programs, once the process has looked them up, and values for them.
   static const Keys& keys();
   static void add(std::int64_t amount) { BHClientScalarAdd(keys().count, amount); }
   static void set(std::int64_t value) { BHClientScalarSet(keys().gauge, value); }
   static void record(double value) { BHClientDistributionRecord(keys().series, value); }
 
   std::vector<std::string> segments() const;
-  /// Reads all segments on, with positions as bytes; acknowledges, and removes what is done.
+  /// Reads on in all segments, with encoded positions; acknowledges, and removes what is done.
   void fold();
   SegmentWriter writerOf(const std::string& segment) const;
 

@@ -71,7 +71,7 @@ TEST_F(BHConfigTest, LoadsGroupsByDeviceAndTaskingSwitch) {
   EXPECT_TRUE(config->configOptionsForScalarKey("mistyped"));
   EXPECT_EQ(fake.log.messages(), Messages{"keyGroup Disabled is disabled by tasking"});
 
-  // The device is asked once per process, so that a second process is needed to see the change.
+  // Each process asks the device only once, so a second process is needed to see the change.
   fake.answers.answers.set("InternalBuild", true);
   EXPECT_FALSE(BHConfig::init(fake.platform)->configOptionsForScalarKey("internal"));
   EXPECT_EQ(fake.answers.questions, Messages{"InternalBuild"});
@@ -119,7 +119,7 @@ TEST_F(BHConfigTest, YieldsNothingForAFileThatCannotBeUsed) {
   EXPECT_FALSE(BHConfig::init(fake.platform)->configOptionsForScalarKey("a"));
 }
 
-// Against the plain definition, over prefixes that nest, branch and share beginnings.
+// Compares with the plain definition, for prefixes that nest, branch and share beginnings.
 TEST(PrefixTreeTest, FindsWhatAWalkOverAllPrefixesFinds) {
   std::vector<std::string> texts{""};
   for (std::size_t i = 0; texts.size() < 364; ++i)

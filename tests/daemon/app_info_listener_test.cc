@@ -59,7 +59,7 @@ struct ListenerTest : ::testing::Test {
     fake.systemVersion.version = {};
   }
 
-  /// Serves a client that sends these events, and yields what only a run that serves logs.
+  /// Serves a client that sends these events, and returns what a run logs only when it serves.
   Messages serve(const std::vector<plist::Value>& events) {
     fake.state = {};
     fake.journal.clear();
@@ -110,7 +110,7 @@ TEST_F(ListenerTest, IgnoresWhatNobodyAskedFor) {
         plist::Value(Dictionary::create()), plist::Value(Dictionary{{"operation", "0"}}),
         plist::Value(Dictionary{{"operation", 0.0}}), plist::Value(Dictionary{{"operation", 2}})})
     EXPECT_EQ(serve({event}), Messages{});
-  // Messages of unknown shape leave the announcement open, those with another number do not.
+  // Messages of an unknown form leave the announcement open; those with another number close it.
   EXPECT_EQ(serve({{}, kAnnounce}).size(), 3U);
   EXPECT_EQ(serve({Dictionary{{"operation", 3}}, kAnnounce}), Messages{});
   EXPECT_EQ(fake.log.messages(LogLevel::Debug),
@@ -124,7 +124,7 @@ TEST_F(ListenerTest, ForcesADayOnce) {
   EXPECT_EQ(serve({Dictionary{{"operation", (std::int64_t{7} << 32) + 1},
                               {"value", (std::int64_t{7} << 32) - 5}}}),
             Messages{"daily tasks for day -5"});
-  // Without a day, or with one that is no integer, a message is of unknown shape.
+  // A message without a day, or with one that is not an integer, has an unknown form.
   EXPECT_EQ(serve({Dictionary{{"operation", 1}}, Dictionary{{"operation", 1}, {"value", 2.0}},
                    Dictionary{{"operation", 1}, {"value", 7}}}),
             Messages{"daily tasks for day 7"});

@@ -90,8 +90,8 @@ TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
                                           kOwn + "LastOSUpdate", "roll support log"}));
 }
 
-// An absent day reads as 0, later than the day before 1970, and 2^40 as its low half, 0; the
-// yesterday of the first day is the last one.
+// An absent day reads as 0, which is later than the day before 1970, and 2^40 as its low half, 0;
+// the day before the first day is the last one.
 TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
   using Case = std::tuple<plist::Value, std::int32_t, bool>;
   for (const auto& [stored, today, runs] :
@@ -107,7 +107,7 @@ TEST_F(DailyRunTest, ComparesDaysSignedAndIn32Bits) {
 }
 
 TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
-  // The last column is what is said about missing days.
+  // The last column is the message about missing days.
   using Case = std::tuple<plist::Value, std::int32_t, std::string>;
   for (const auto& [stored, today, days] :
        {Case({}, 20000, ""), Case("19000", 20000, ""), Case(19998, 20000, ""),

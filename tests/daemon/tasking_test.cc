@@ -54,7 +54,7 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
 
   const std::string set = "set com.norvane.tallied.tavrel Tasking";
   const Journal applied{"set b k", "set a k", "set b l",
-                        // Then what it takes to undo them.
+                        // Then the data needed to undo them.
                         set + "ID", set + "OS", set + "Digest", set + "Payload", "synchronize a",
                         "synchronize b", "synchronize com.norvane.tallied.tavrel",
                         "post com.norvane.da.tasking_changed"};
@@ -78,7 +78,7 @@ TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
   EXPECT_EQ(Journal(again.begin() + 7, again.end()), applied);
   EXPECT_EQ(own.get("TaskingOS"), plist::Value("21B1"));
 
-  // A tasking without a payload only undoes; it is new again at every run.
+  // A tasking without a payload only reverts; it counts as new at every run.
   schedule({{"TaskingID", "two"}});
   track();
   EXPECT_EQ(fake.log.messages(), Messages{"Tasking update (one -> two, 21B1 -> 21B1)"});
@@ -131,7 +131,7 @@ TEST_F(TaskingTest, SubmitsAtOnceForSomeDaysAfterAnUpdate) {
   fake.submission.taskingValues.set("AggressiveSubmissionDays", 3);
   schedule({{"TaskingID", 1}});
   EXPECT_EQ(track(), Journal{});
-  // One that cannot be applied is scheduled.
+  // A tasking that cannot be applied counts as scheduled.
   const std::string tooLong(1048259, 'x');
   schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", tooLong)}}});
   EXPECT_EQ(track(), Journal{"submit now"});

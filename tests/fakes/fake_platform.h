@@ -1,5 +1,5 @@
-// A platform in memory for tests: services that hold state, with public fields to set up and a
-// record of what was done to them. Property lists are coded for real.
+// An in-memory platform for tests: services that hold state, with public fields for setup and a
+// record of the calls. Property lists are really encoded and decoded.
 #pragma once
 
 #include <algorithm>
@@ -19,7 +19,7 @@
 
 namespace tavrel::fakes {
 
-/// Calls in the order in which they were made, where the order matters.
+/// Calls in their order, where the order matters.
 using Journal = std::vector<std::string>;
 
 struct FakeClock : Clock {
@@ -38,7 +38,7 @@ struct FakeLog : SystemLog {
   void write(LogLevel level, std::string_view message) override {
     entries.emplace_back(level, message);
   }
-  /// The messages at a level, or at all levels but debug.
+  /// The messages at a level, or at all levels except debug.
   std::vector<std::string> messages(std::optional<LogLevel> level = {}) const {
     std::vector<std::string> texts;
     for (const auto& [entryLevel, text] : entries) {
@@ -77,7 +77,7 @@ struct FakeDistribution : BHHistoryDistributionEnumerator {
   }
   std::string packed, offsets;
   bool wasRead = false;
-  bool fails = false;  // behind the values
+  bool fails = false;  // after the values
 
   DistributionBlock nextBlock(bool) override {
     if (!std::exchange(wasRead, true)) return {packed, offsets};
@@ -92,7 +92,7 @@ struct FakeStore : StatisticsStore {
   std::int32_t today = 20000;
   std::vector<std::tuple<std::string, std::int32_t, std::int64_t>> scalars;
   std::vector<std::tuple<std::string, std::int32_t, std::vector<double>>> distributions;
-  std::set<std::string> keysRead;  // distributions whose values were asked for
+  std::set<std::string> keysRead;  // distributions whose values were read
   bool keepsValues = true;
 
   std::int32_t BHDaysSince1970() override { return today; }
@@ -199,7 +199,7 @@ struct FakeSystemVersion : SystemVersion {
   plist::Dictionary systemVersionDictionary() override { return version; }
 };
 
-/// Plays a list of events; every slice after them runs out of time.
+/// Plays a list of events; every later slice runs out of time.
 struct FakeEventLoop : EventLoop {
   std::deque<std::function<void()>> events;
   bool terminates = false;
@@ -240,7 +240,7 @@ struct FakeLocale : Locale {
   std::optional<std::string> countryCode() override { return country; }
 };
 
-/// Controls with a value, and the answers of "kern.next_ecc_event"; all others do not exist.
+/// Controls with a value, and the answers of "kern.next_ecc_event"; no others exist.
 struct FakeControls : SystemControls {
   std::map<std::string, std::vector<std::byte>, std::less<>> values;
   std::deque<std::vector<std::byte>> eccEvents;
@@ -267,7 +267,7 @@ struct FakeLoader : DynamicLoader {
   std::unique_ptr<DynamicLibrary> load(std::string_view path) override;
 };
 
-/// Hands the peer of a test to whoever listens.
+/// Passes the test's peer to the listener.
 struct FakeServices : NamedServices {
   struct Peer : PeerConnection {
     EventHandler handler;
@@ -276,7 +276,7 @@ struct FakeServices : NamedServices {
     void resume() override { resumed = true; }
   };
   bool available = true;
-  std::string name;  // of the service listened on, once its listener was resumed
+  std::string name;  // the service listened on, once its listener was resumed
   ServiceListener::PeerHandler peerHandler;
 
   std::unique_ptr<ServiceListener> createListener(std::string_view serviceName) override;
@@ -297,14 +297,14 @@ struct FakeProcess : Process {
   std::int32_t identifier() override { return 211; }
 };
 
-/// What was printed.
+/// Keeps what was printed.
 struct FakeStreams : StandardStreams {
   std::string output, error;
   void writeOutput(std::string_view text) override { output += text; }
   void writeError(std::string_view text) override { error += text; }
 };
 
-/// No drivers, or those of the registry that it wraps.
+/// No drivers, or those of the registry behind it.
 struct FakeRegistry : DriverRegistry {
   DriverRegistry* behind = nullptr;
 
@@ -327,7 +327,7 @@ struct FakeSnapshots : StackSnapshots {
   std::unique_ptr<StackSnapshot> create() override;
 };
 
-/// All of them, and the `Platform` over them.
+/// All fakes, and the `Platform` made of them.
 struct FakePlatform {
   Journal journal;
   FakeApplications applications;

@@ -1,4 +1,4 @@
-// FNV-1a, to pin texts that are too long to be part of a test.
+// FNV-1a, to check texts that are too long to include in a test.
 #pragma once
 
 #include <cstdint>

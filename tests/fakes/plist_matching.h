@@ -8,7 +8,7 @@
 
 namespace tavrel::plist {
 
-/// Equal content; an empty handle is equal to an empty handle only.
+/// Equal content; an empty handle equals only an empty handle.
 inline bool operator==(const Dictionary& a, const Dictionary& b) {
   return Value(a) == Value(b);
 }

@@ -1,4 +1,4 @@
-// Debian's ClickHouse server as a process of its own, in a temporary folder.
+// Debian's ClickHouse server as a separate process, in a temporary folder.
 #pragma once
 
 #include <fcntl.h>
@@ -11,7 +11,7 @@ namespace tavrel::fleet {
 
 class ClickhouseServer {
  public:
-  /// The ports of others that make a cluster "pair" with this one.
+  /// `pair` has the ports of servers that form a cluster "pair" with this one.
   explicit ClickhouseServer(const std::vector<int>& pair = {}) {
     listenAtFreePort(port);
     if (!pair.empty()) nativePort = pair[0];

@@ -1,4 +1,4 @@
-// What every engine has to do, on each of them.
+// What every engine must do, tested on each of them.
 #include <cmath>
 #include <gmock/gmock.h>
 #include <limits>
@@ -17,7 +17,7 @@ namespace {
 using testing::ElementsAre;
 using testing::UnorderedElementsAreArray;
 
-// Databases that are not there yet.
+// Names databases that do not exist yet.
 class Site {
  public:
   explicit Site(bool isServer) {

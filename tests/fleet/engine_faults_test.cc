@@ -1,4 +1,4 @@
-// Kills, files that are no databases, servers that are away, refuse or are slow.
+// Kills, files that are not databases, and servers that are away, refuse, or are slow.
 #include <chrono>
 #include <gmock/gmock.h>
 #include <sqlite3.h>
@@ -44,7 +44,7 @@ void appendInPortions(const std::string& where, const std::vector<LogRecord>& re
     engine->append(std::span(records).subspan(first, 8));
 }
 
-// Kills loaders at ever later moments; the next loader completes what each has begun.
+// Kills loaders at later and later moments; the next loader completes what each has begun.
 void killLoaders(const std::function<std::string(std::size_t)>& whereOf) {
   const std::vector<LogRecord> all = records(16);
   appendInPortions(whereOf(0), all);

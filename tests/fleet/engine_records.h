@@ -1,4 +1,4 @@
-// Records for tests of engines, and all that an engine hands out as text that can be compared.
+// Records for tests of engines, and everything that an engine hands out, as comparable text.
 #pragma once
 
 #include <algorithm>
@@ -27,7 +27,7 @@ inline std::string bitsOf(double value) {
   return std::to_string(std::bit_cast<std::uint64_t>(value));
 }
 
-/// Each row of a database, as lines in the order of their text. A log has the name of its creation.
+/// Each row of a database as a line, sorted as text. A log is named after its creation time.
 inline std::vector<std::string> rowsIn(Engine& engine) {
   std::vector<std::string> lines;
   std::map<LogId, std::string> names;

@@ -1,4 +1,4 @@
-// The tables as people and other programs see them, and tables on several servers.
+// The tables as people and other programs see them, and tables spread over several servers.
 #include <gmock/gmock.h>
 #include <sqlite3.h>
 
@@ -82,7 +82,7 @@ TEST(EngineTables, AreSharedByTheServersOfACluster) {
   openEngine(two.address("d"), OpenMode::kWrite)->append(records(20));
   const auto engine = openEngine(address, OpenMode::kWrite);
   EXPECT_EQ(engine->append(records(600)).known, 20u);
-  // A loader that knows one server only brings what another one has.
+  // A loader that knows only one server files logs that another server has.
   openEngine(one.address("d"), OpenMode::kWrite)->append(records(40));
   EXPECT_NE(one.ask("SELECT count() FROM d.log"), "0\n");
   EXPECT_GT(std::stoi(two.ask("SELECT count() FROM d.log")), 20);

@@ -1,4 +1,4 @@
-// Questions put to whole fleets: what the answers hold, and what they must not.
+// Questions about whole fleets: what the answers contain, and what they must not reveal.
 #include <cmath>
 #include <gmock/gmock.h>
 #include <map>
@@ -47,7 +47,7 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
   EXPECT_EQ(side.whole.scalar->mean, 19.5);
   EXPECT_EQ(side.whole.scalar->squaredDeviations, 2 * 40 * (1600 - 1) / 12.0);
   EXPECT_THAT(side.whole.scalar->percentiles, ElementsAre(1, 9, 19, 29, 37));
-  // Of 20 there is one device, in a bucket by itself.
+  // Only one device has 20, so that is in a bucket by itself.
   EXPECT_EQ(side.groups[0].histogram.pieces.front(), (Piece{15, 25, 12, 12}));
   EXPECT_EQ(side.whole.histogram.values, 80u);
 
@@ -71,7 +71,7 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
     if (device < 2) record.cells.push_back({"d", 20, kInfinity, "(20, inf)", 1});
     record.cells.push_back({"d", 10, 20, "(10, 20]", 1});
   }
-  for (int device = 0; device < 3; ++device) {  // a whitelist of few devices, and one without
+  for (int device = 0; device < 3; ++device) {  // a whitelist with few devices, and one without
     LogRecord& record = fleet.add(1, "OS 1");
     record.distributions = {{"d", {1, 31, 10, 0, 2}}};
     if (device > 0) record.cells = {{"d", 5, 15, "(5, 15]", 2}};
@@ -89,7 +89,7 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
   EXPECT_EQ(whole.merged->numbers.mean, (4 * 190 + 60) / 86.0);
   EXPECT_EQ(whole.merged->logsWithoutMean, 1u);
   // The two devices above 20 are joined with their neighbours. The 7 values of the last four
-  // devices may lie anywhere, with those of the smallest bucket.
+  // devices may lie anywhere, as may those of the smallest bucket.
   EXPECT_THAT(whole.histogram.pieces,
               ElementsAre(Piece{-kInfinity, 10, 58, 87}, Piece{10, kInfinity, 0, 29}));
   EXPECT_EQ(whole.histogram.values, 87u);
@@ -116,7 +116,7 @@ TEST(ShowTest, TellsNoMeanOfFewDevices) {
   const ShowSide& side = answer.sides[0];
   EXPECT_EQ(side.whole.merged->numbers.mean, (6 + 145 + 245) / 24.0);
   EXPECT_EQ(side.groups[1].merged->numbers.mean, 14.5);
-  // The second one without the first would tell of four devices.
+  // Subtracting the first from the second would reveal figures of four devices.
   for (const std::size_t group : {0u, 2u}) {
     EXPECT_TRUE(std::isnan(side.groups[group].merged->numbers.mean));
     EXPECT_EQ(side.groups[group].merged->deviation, std::nullopt);
@@ -124,15 +124,15 @@ TEST(ShowTest, TellsNoMeanOfFewDevices) {
   }
 }
 
-/// What is in one of the two sets but not in both.
+/// The logs that are in exactly one of the two sets.
 LogSet differenceOf(const LogSet& a, const LogSet& b) {
   LogSet difference = a.without(b);
   difference.add(b.without(a));
   return difference;
 }
 
-/// Whether all that can be computed from the shown sets is of enough devices: the logs that the
-/// same sets contain, for each choice of sets, are no devices or enough.
+/// Checks that everything computable from the shown sets is of enough devices: for each choice of
+/// sets, the logs in exactly these are of no devices or of enough.
 void expectNothingSmallFollows(const Ledger& ledger) {
   const LogTable& table = ledger.table();
   for (const auto& [subject, sets] : ledger.shown()) {
@@ -143,7 +143,7 @@ void expectNothingSmallFollows(const Ledger& ledger) {
         EXPECT_TRUE(devices == 0 || devices >= ledger.devicesAtLeast()) << subject << devices;
       }
     }
-    if (subject == "logs") continue;  // of several groupings
+    if (subject == "logs") continue;  // it has several groupings
     std::map<std::vector<bool>, LogSet> cells;
     for (LogIndex log = 0; log < table.size(); ++log) {
       std::vector<bool> in;
@@ -268,14 +268,14 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   const Comparison& slower = answer.comparisons[2];
   EXPECT_NEAR(slower.difference, 9, 2);
   EXPECT_NEAR(*slower.effect, 0.9, 0.2);
-  // 100 devices a side on each of three days count as 100 values: 1.97 × √(2 × 10² / 100).
+  // 100 devices per side on each of three days count as 100 values: 1.97 × √(2 × 10² / 100).
   EXPECT_NEAR(slower.margin, 2.79, 0.15);
   EXPECT_EQ(answer.comparisons[0].effect, std::nullopt);
   EXPECT_EQ(answer.comparisons.back().effect, 0);
 }
 
-// Devices that report often and are each like themselves: as values by themselves, their logs would
-// show differences that are none.
+// Each device reports often and always the same. If its logs counted as independent values, they
+// would show differences that do not exist.
 TEST(CompareTest, TakesNoDayOfADeviceForAnotherDevice) {
   std::mt19937 random(5);
   std::normal_distribution<double> noise(0, 1000);

@@ -1,4 +1,4 @@
-// Arithmetic of the questions, against rational numbers and known values of Student's distribution.
+// The questions' arithmetic, checked against rational numbers and known values of Student's t.
 #include <algorithm>
 #include <cmath>
 #include <gmock/gmock.h>
@@ -60,7 +60,7 @@ TEST(ExactMomentsTest, AreTheNearestDoublesInAnyOrder) {
       {{{1, 0, 1}, {0x1.0000000000001p+0, 0, 1}}, 1, 0x1p-105},
       {{{-0.0, 0, 4}}, 0, 0},
       {{{1, 0, UINT64_MAX - 1}, {3, 0, 1}}, 1, 4},
-      // What is not defined by arithmetic.
+      // Cases that arithmetic does not define.
       {{}, kNan, kNan},
       {{{1, 0, UINT64_MAX}, {3, 0, 1}}, kNan, kNan},
   };
@@ -97,7 +97,7 @@ TEST(MergedNumbersTest, KeepTheEndsInAnyOrder) {
     EXPECT_EQ(bitsOf(merged.numbers().minimum), bitsOf(-0.0));
     EXPECT_EQ(merged.numbers().maximum, kInfinity);
     EXPECT_EQ(merged.numbers().count, 5ull + UINT32_MAX);
-    // Of {1, 1}, 1 and 2^32 - 1 times 3, without the two that are no finite numbers.
+    // The mean of {1, 1}, 1 and 2^32 - 1 times 3, without the two that are not finite.
     EXPECT_EQ(merged.numbers().mean, (3 + 3.0 * UINT32_MAX) / (3.0 + UINT32_MAX));
     EXPECT_NEAR(*merged.standardDeviation(), std::sqrt(14.0 / (3.0 + UINT32_MAX)), 1e-12);
     EXPECT_EQ(merged.logsWithoutMean(), 2u);
@@ -115,7 +115,7 @@ TEST(HistogramTest, BoundsWhatDifferentBoundariesLeaveOpen) {
   EXPECT_THAT(piecesOf(cells), ElementsAre(Piece{-kInfinity, 10, 4, 7}, Piece{10, 15, 0, 14},
                                            Piece{15, 20, 1, 12}, Piece{20, kInfinity, 2, 2}));
   EXPECT_EQ(valuesOf(cells), 21u);
-  // Ranks 2, 6, 11, 16, 20 of 21.
+  // Ranks 2, 6, 11, 16 and 20 of 21.
   const unsigned percents[] = {5, 25, 50, 75, 95};
   EXPECT_THAT(percentilesOf(cells, percents),
               ElementsAre(Interval{-kInfinity, 10}, Interval{-kInfinity, 15}, Interval{10, 20},

@@ -1,4 +1,4 @@
-// The commands that ask questions, on both engines.
+// The question commands, on both engines.
 #include <algorithm>
 #include <filesystem>
 #include <gmock/gmock.h>
@@ -104,7 +104,7 @@ TEST_F(QuestionCommands, AnswerInTheSameBitsOnBothEnginesInAnyOrder) {
   }
 }
 
-// As Grafana's data source fills in its variables.
+// Fills in the variables as Grafana's data source does.
 TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
   ClickhouseServer server;
   load(server.address("fleet"), 1);
@@ -142,7 +142,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_GT(first["lower"], 10);
   EXPECT_LT(first["upper"], 40);
   EXPECT_EQ(compared["comparisons"][1]["after"]["logs_without_mean"], 3);
-  EXPECT_EQ(compared["comparisons"][3]["effect"], 0);  // all are alike
+  EXPECT_EQ(compared["comparisons"][3]["effect"], 0);  // all logs are alike
   const auto shown =
       nlohmann::json::parse(run(file, {"show", kSlow, "--by", "region", "--json"}).out);
   const auto& side = shown["answers"][0]["sides"][0];
@@ -150,7 +150,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   for (const auto& group : side["groups"])
     groups += group["part"].dump() + group["group"].dump();
   EXPECT_EQ(groups, R"x("not_told"null"value""(other)""other"null)x");
-  EXPECT_EQ(side["joined"], 2);  // of AT and LI, 14 devices
+  EXPECT_EQ(side["joined"], 2);  // AT and LI, 14 devices
   EXPECT_EQ(side["all"]["values"], 840);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["above"], 100);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["at_most"], nullptr);
@@ -232,7 +232,7 @@ TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
   const std::pair<std::string, std::string> shells[] = {
       {"fish", asks + "fish -c 'source " + folder +
                    "/script.fish; complete -C \"tavrel-fleet --database h:1/d compare \"'"},
-      // Its functions for completion work in a terminal only.
+      // zsh's completion functions work only in a terminal, so replace them.
       {"zsh", asks +
                   "zsh -fc '_arguments() { state=argument; words=(compare \"\"); "
                   "[[ $* != *versions* ]] || _tavrel_fleet_list versions }\n"

@@ -13,7 +13,7 @@ namespace tavrel::fleet {
 
 class TestFleet {
  public:
-  /// A log with the number of those before it as its identity; valid until the next one.
+  /// Adds a log, identified by the number of earlier logs; valid until the next one.
   LogRecord& add(std::int32_t day, std::string_view version, std::string_view region = "DE") {
     LogRecord& record = records_.emplace_back(makeRecord(records_.size(), day));
     record.osVersion = record.texts.keep(version);

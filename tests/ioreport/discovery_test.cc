@@ -38,7 +38,7 @@ TEST(DiscoveryTest, ReadsLegendsAsFarAsTheyAreSound) {
       {legend(Array::create()), "", "none"},
       {legend({}), "", "e00002f0 no legend"},
       {legend("text"), "", "e00002c9 bad legend"},
-      // A malformed entry ends the walk, what is no array the group.
+      // A malformed entry ends the walk; a group that is not an array is skipped.
       {legend(Array{channelsOf({kA}), 5, kSound}), "a", "none"},
       {legend(Array{kSound, groupOf({}, "S", Array{kA}), kSound}), "c", "none"},
       {legend(Array{kSound, groupOf(1, "S", Array{kA}), kSound}), "c", "none"},
@@ -67,7 +67,7 @@ TEST(DiscoveryTest, ReadsLegendsAsFarAsTheyAreSound) {
   }
   EXPECT_FALSE(IOReportCopyChannelsForDriver(nullptr, 0, nullptr));
 
-  // Drivers that fail are printed when that is asked for; the others are still found.
+  // Drivers that fail are printed on request; the others are still found.
   const Array services{driverOf("bad", 17, Array{channelsOf({Array{"x", 1}})}), publishing(1),
                        driverOf("worse", 18, 5), legend(Array{kSound})};
   const std::string kPrinted = "bad <id 0x11>: " + kNoText + "\nworse <id 0x12>: bad legend\n";
@@ -110,7 +110,7 @@ TEST(DiscoveryTest, FilesChannelsByDriverGroupAndSubgroup) {
         Case(aggregateOf("text"), plain, 0, kKernelError),
         Case({{"IOReportDrivers", 1}}, plain, 1, kKernelError),
         Case(empty, nameless, 1, kKernelError), Case(noGroups, nameless, 2, kKernelError),
-        // A group's table is made; without a group the channel stands at the top.
+        // The table of a group is made; without a group, the channel is at the top level.
         Case(in("IOReportChannelGroups", "G", {}), nameless, 2, kKernelSuccess),
         Case(empty, plain, 2, kKernelSuccess)}) {
     Failure failure;
@@ -174,7 +174,7 @@ TEST(DiscoveryTest, StopsWalksThatFailOrThatTheRegistryChangedUnder) {
       {INT32_MAX, "f", createCFErr(1, "why"), ""},
       {INT32_MIN, "f", createCFErr(1, "why"), "f: why\n"},
       {-1, {}, bare, "<unknown> function: KernelReturn error 0x5\n"},
-      {-1, "f", createCFErr(1, "\xff"), "f: <unknown> error\n"}};  // no UTF-8: no error object
+      {-1, "f", createCFErr(1, "\xff"), "f: <unknown> error\n"}};  // not UTF-8, so no error object
   for (const auto& [options, name, error, printed] : kPrints) {
     fakes::FakeStreams streams;
     iorErrLog(streams, options, name, error);

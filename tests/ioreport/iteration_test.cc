@@ -10,8 +10,8 @@ using namespace reporting;
 
 constexpr auto kKeep = [](const auto&...) { return kIterateContinue; };
 
-// Channels of one letter each, filed by driver and group: the first letter of a text names the
-// driver, the second the group, "-" for none.
+// Channels with names of one letter, grouped by driver and group: the first letter of a text names
+// the driver, the second the group ("-" for none).
 Dictionary treeOf(std::initializer_list<std::string_view> texts) {
   const Dictionary aggregate = IOReportCreateAggregate(3);
   for (const std::string_view text : texts) {
@@ -29,7 +29,7 @@ Dictionary letters(std::string_view text) {
   return aggregate;
 }
 
-// A walk and a pruning see the same channels; the last column is what the pruning leaves.
+// A walk and a pruning see the same channels; the last column is what pruning leaves.
 TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
   using Case = std::tuple<std::vector<IterateResult>, std::string, IterateResult, std::string>;
   for (const bool isTree : {false, true}) {
@@ -52,7 +52,7 @@ TEST(IterationTest, CollectsAnswersUntilAnOddOne) {
         const std::string rest = walk == IOReportPrune ? left : "abcdef";
         EXPECT_EQ(namesIn(aggregate), rest);
         EXPECT_EQ(IOReportGetChannelCount(aggregate), static_cast<std::int32_t>(rest.size()));
-        EXPECT_EQ(aggregate.size(), rest.empty() ? 1U : 2U);  // the options, and what is left
+        EXPECT_EQ(aggregate.size(), rest.empty() ? 1U : 2U);  // the options, and the rest
       }
     }
   }
@@ -80,7 +80,7 @@ TEST(IterationTest, FailsForMalformedAggregates) {
   endless.remove("IOReportDrivers");
   EXPECT_EQ(iterateAggregate(letters("a"), {}, CloneWalk{kKeep}, nullptr), 273);
   EXPECT_EQ(IOReportIterate(letters("a"), nullptr), 273);
-  // Entries that are no levels are passed over when there are others.
+  // Entries that are not levels are skipped when there are others.
   EXPECT_EQ(IOReportGetChannelCount(drivers(Dictionary{{"a", 5}, {"b", letters("b")}})), 1);
 }
 
@@ -99,7 +99,7 @@ TEST(IterationTest, MergesByReferenceAsTheDestinationFiles) {
     EXPECT_EQ(IOReportMergeChannels(into, source, failure), result);
     EXPECT_EQ(failure.text(), text);
   }
-  // A source that holds the destination, or shares its channels, is still finite.
+  // Even if the source contains the destination, or shares its channels, the result is finite.
   const Dictionary tree = treeOf({"d-a", "e-b"});
   const Dictionary inside = tree.dictionary("IOReportDrivers").dictionary("d");
   EXPECT_EQ(IOReportMergeChannels(inside, tree, nullptr), 0);
@@ -121,8 +121,8 @@ TEST(IterationTest, ClonesWhatIsKept) {
   EXPECT_EQ(driver.get("IOReportChannelGroups"), (Dictionary{{"g", aggregateOf(Array::create())}}));
 }
 
-// Behind its own index a channel is searched for from i + 1, or from behind the last one found so.
-// The rule of pairing, as plainly as it can be written; "-" for no match.
+// The rule of pairing in its plainest form: if the channel is not at its own index, it is searched
+// for from i + 1, or from after the last one found in this way; "-" means no match.
 std::string plainPairs(std::string_view channels, std::string_view others) {
   std::string pairs;
   std::optional<std::size_t> start;

@@ -38,7 +38,7 @@ struct Element {
 
 using Sample = std::vector<Element>;
 
-/// A group of elements of driver 7 as it stands in a buffer.
+/// A group of elements of driver 7, as stored in a buffer.
 inline std::vector<std::byte> groupOf(std::uint64_t channelID, std::uint64_t type,
                                       const Sample& elements) {
   std::vector<std::byte> bytes;
@@ -56,7 +56,7 @@ inline Dictionary channelOf(std::int64_t driverID, std::int64_t channelID, std::
           {"LegendChannel", Array{channelID, static_cast<std::int64_t>(type)}}};
 }
 
-/// A sampled channel that has as many elements as its type counts.
+/// A sampled channel with as many elements as its type says.
 inline Dictionary sampleOf(std::uint64_t format, const Sample& elements, std::int64_t channelID = 9,
                            const Dictionary& info = {}) {
   const std::uint64_t type = typeOf(format, elements.size());
@@ -100,7 +100,7 @@ struct Failure {
   }
 };
 
-/// Names of the channels of an aggregate in the order of a walk.
+/// Names of an aggregate's channels in the order of a walk.
 inline std::string namesIn(const Dictionary& aggregate) {
   std::string names;
   IOReportIterate(aggregate, [&](const Dictionary& channel) {

@@ -39,7 +39,7 @@ TEST(SubscriptionTest, SamplesWhatTheHubHolds) {
   const Dictionary delta = IOReportCreateSamplesDelta(first, second, failure);
   EXPECT_EQ(valueOf(delta, 0), 15);
   EXPECT_EQ(valueOf(delta, 1), 0);
-  // The type of C came with its elements, into the samples only.
+  // The type of C arrived with its elements, only in the samples.
   std::uint64_t type = 0;
   EXPECT_EQ(getChannelType(channelIn(first, 1), type), kKernelSuccess);
   EXPECT_EQ(type, typeOf(1, 1, 5));
@@ -99,8 +99,8 @@ TEST(SubscriptionTest, FailsAtEachStepWithItsOwnWords) {
     EXPECT_FALSE(createInterestList(kWanted, count)) << count;
 }
 
-// The rule of extraction, as plainly as it can be written: the element at which the channel's
-// group stands, -1 for none, -2 when an empty group ends the sampling.
+// The rule of extraction in its plainest form: the index of the element where the channel's group
+// begins, -1 for none, -2 when an empty group ends the sampling.
 int plainGroup(ByteSpan buffer, std::uint64_t channelID) {
   const std::size_t elements = buffer.size() / 64;
   for (std::size_t i = 0; i < elements;) {
@@ -162,7 +162,7 @@ TEST(SamplesTest, TellsWhyThereAreNone) {
       {kWanted, ended, "e00002bc" + kFailure},
       {onlyA, ended, "none"},
       {aggregateOf({channelIn(kWanted, 1), 5}), one, "e00002f0" + kFailure},
-      {kWanted, other, "none"}};  // without any channel
+      {kWanted, other, "none"}};  // no channel at all
   for (const auto& [channels, buffer, text] : kCases) {
     Failure failure;
     IOReportCreateSamplesRaw(channels, buffer, failure);
@@ -180,7 +180,7 @@ TEST(DeltaTest, SubtractsByFormat) {
         Case(3, {{{0, 1, 2, kNone}}}, {{{3, 7, 8, 9}}}, Sample{{{3, 7, 8, 9}}}),
         Case(3, {{{4, 1, 2, 30}}}, {{{6, 7, 8, 9}}}, Sample{{{2, 7, 8, -21}}}),
         Case(4, {{{1, kNone, 7, kNone}}}, {{{5, 7, kNone, kNone}}}, Sample{{{4, 7, 7, kNone}}}),
-        // Without a delta.
+        // No delta.
         Case(1, {{{kNone}}}, {{{1}}}, {}), Case(1, {{{1}}}, {{{kNone}}}, {}),
         Case(1, {{}, {}}, {{}, {}}, {}), Case(2, {{{5, kNone, 2}}}, {{{5, 1, 2}}}, {}),
         Case(2, {{}, {{5, 1, 2}}}, {{}, {{5, 1, kNone}}}, {}), Case(3, {{{kNone}}}, {{{1}}}, {}),
@@ -199,7 +199,7 @@ TEST(DeltaTest, SubtractsByFormat) {
     EXPECT_EQ(failure.text(), delta ? "none" : (format == 1 ? "e00002bc " : "1 ") + kNoText);
     if (!expected) continue;
     EXPECT_EQ(delta.get("RawElements"), sampleOf(format, *expected).get("RawElements"));
-    // Of a simple channel only the first value is one.
+    // For a simple channel, only the first value is a value.
     const Elements paired = getRawElements(channelIn(deltas), static_cast<std::uint8_t>(format));
     for (std::size_t i = 0; i < (format == 1 ? 1 : 4); ++i)
       EXPECT_EQ(paired.value(0, i), expected->front().values.at(i));
@@ -227,7 +227,7 @@ TEST(DeltaTest, RefusesWhatItCannotSubtract) {
     EXPECT_FALSE(IOReportSampleCreateDelta(previous, current, failure));
     EXPECT_EQ(failure.text(), text);
   }
-  // In whole samples a channel without a match keeps its values.
+  // Among whole samples, a channel without a match keeps its values.
   const Dictionary alone = aggregateOf({sampleOf(1, {{{12}}})});
   EXPECT_EQ(IOReportCreateSamplesDelta(aggregateOf(Array::create()), alone, nullptr), alone);
 }

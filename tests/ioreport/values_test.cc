@@ -12,7 +12,7 @@ namespace {
 using namespace reporting;
 using namespace std::string_literals;
 
-// What the accessors read: of a simple channel and an array at -1 to 8, then counts, extremes and
+// What the accessors read: for a simple channel and an array at -1 to 8, then counts, extremes and
 // the current state, and the values of buckets and states at -1 to 3; "-" for none.
 std::string readingsOf(const Dictionary& channel) {
   const auto shown = [](std::int64_t value) {
@@ -57,7 +57,7 @@ TEST(ValuesTest, ReadsWhatIsOfItsFormatAndThere) {
       {brief, kNothing},
       {sampleOf(1, {{}, {}}), kNothing},
       {typed(sampleOf(1, {{}}), typeOf(4, 1)), kNothing},
-      // The type's count matters to histograms and states only.
+      // The type's count matters only for histograms and states.
       {typed(sampleOf(1, {{{-5}}}), typeOf(1, 9)), "-5" + kNothing.substr(1)},
       {sampleOf(4, {{{10, 11, 12, 13}}, {{14, 15, 16, 17}}}),
        "- |-1011121314151617-| -1" + kNoBuckets + kNoStates},
@@ -119,8 +119,8 @@ Dictionary configured(const std::vector<Segment>& segments, std::size_t elements
   return sampleOf(3, Sample(elements), 9, info);
 }
 
-// Bounds that do not ascend, wrap, or are more than the elements fail; bytes behind the last whole
-// segment are not read.
+// Bounds that do not ascend, overflow, or outnumber the elements fail; bytes after the last
+// whole segment are not read.
 TEST(ValuesTest, WorksOutBucketBounds) {
   using Case = std::pair<Dictionary, Array>;
   for (const auto& [channel, bounds] :
@@ -192,7 +192,7 @@ TEST(UnitTest, LabelsQuantitiesAndScales) {
   EXPECT_EQ(IOReportChannelGetUnitLabel(channel)->data(), label->data());
 }
 
-// A factor times 10^x times 2^y in 64 bits, by another way: the twos of the tens are shifted.
+// A factor times 10^x times 2^y in 64 bits, in another way: the tens' twos are shifted.
 std::uint64_t scaled(std::uint64_t factor, int tens, int twos) {
   for (int i = 0; i < tens; ++i)
     factor *= 5;
@@ -283,7 +283,7 @@ TEST(DescriptionTest, DescribesSamples) {
       {{}, {}}};
   for (const auto& [channel, text] : kCases)
     EXPECT_EQ(IOReportSampleCopyDescription(channel, 0, ">"), text);
-  // A long name for many elements would fill the memory.
+  // A long name for many elements would exhaust the memory.
   Dictionary large = sampleOf(1, Sample(1000));
   large.set("ChannelName", std::string(1 << 20, 'x'));
   EXPECT_EQ(IOReportSampleCopyDescription(large, 0, ""), std::nullopt);

@@ -1,4 +1,4 @@
-"""Headless Chromium through the DevTools protocol, over its pipe."""
+"""Headless Chromium, controlled with the DevTools protocol over a pipe."""
 
 import base64
 import json
@@ -9,7 +9,7 @@ import tempfile
 
 
 class Browser:
-    """Opens one page. As a context manager it ends the browser."""
+    """Opens one page. As a context manager, ends the browser."""
 
     def __init__(self):
         program = os.environ.get("CHROMIUM") or shutil.which("chromium")
@@ -57,7 +57,7 @@ class Browser:
         return json.loads(message[:-1])
 
     def take(self):
-        """What has arrived of one message."""
+        """The part of a message that has arrived."""
         ready = self.reader.peek()
         end = ready.find(b"\0") + 1
         return self.reader.read(end or len(ready))
@@ -88,7 +88,7 @@ class Browser:
             self.events.append(self.receive())
 
     def open(self, file, width, scheme):
-        """Loads a file; `events` then has what the page requested."""
+        """Loads a file; afterwards, `events` has the page's requests."""
         self.call("Emulation.setDeviceMetricsOverride", width=width, height=900,
                   deviceScaleFactor=1, mobile=width < 500)
         self.call("Emulation.setEmulatedMedia",

@@ -1,4 +1,4 @@
-"""A device in a folder, with statistics of some days, drives, drivers and hostile keys."""
+"""A device in a folder, with statistics of several days, drives, drivers and hostile keys."""
 
 import math
 import os
@@ -37,7 +37,7 @@ class Device:
                 plistlib.dump(value, file)
 
     def statistics(self, days, hole=(), scalars=8, distributions=3, values=48):
-        """Days up to yesterday, without those whose number, counted back from today, is in `hole`."""
+        """Adds days up to yesterday, except those whose number, back from today, is in `hole`."""
         lines = []
         for back in range(days, 0, -1):
             day = TODAY - back
@@ -59,7 +59,7 @@ class Device:
         self.run("stat", "import", "-", text="\n".join(lines) + "\n")
 
     def furnish(self, examples):
-        """Everything but statistics."""
+        """Adds everything but statistics."""
         exact = {"bucket_interval": 1}
         self.write("Library/Application Support/Brimhold/Whitelist_Pellio.plist", {
             "Usage": {

@@ -3,7 +3,7 @@
 
     fleet_page_test.py TAVREL_FLEET [FOLDER]
 
-With FOLDER, also leaves the page there, with a picture at each width in both colour schemes.
+With FOLDER, also saves the page there, with a picture at each width in both colour schemes.
 """
 
 import datetime
@@ -27,7 +27,7 @@ FIRST = datetime.datetime(2026, 11, 20)
 
 
 def write_log(folder, number, device, day):
-    """Of 40 devices half have the new version, on which some statistics changed."""
+    """Half of the 40 devices have the new version, on which some statistics changed."""
     is_new = device % 2
     mean = random.gauss(300 if is_new else 200, 40)
     has_mean = number > 1

@@ -1,4 +1,4 @@
-"""Looks for faults of a page that readers would see, in headless Chromium."""
+"""Looks in headless Chromium for faults of a page that readers would see."""
 
 import os
 import re
@@ -11,7 +11,7 @@ with open(os.path.join(os.path.dirname(os.path.abspath(__file__)), "inspect.js")
           encoding="utf-8") as source:
     INSPECT = source.read()
 
-# What turns the direction of text is visible.
+# Characters that change the direction of text are shown.
 TURNED = re.sub("[\u202e\u202c\u2067]", "\ufffd", OVERRIDE)
 
 
@@ -21,7 +21,7 @@ def expect(actual, expected, what):
 
 
 def inspect(browser, file, charts):
-    """Faults at all widths in both colour schemes. `charts` is how many there are."""
+    """Checks a page at all widths in both colour schemes. It must have `charts` charts."""
     for width in WIDTHS:
         for scheme in ("light", "dark"):
             what = f"{os.path.basename(file)}, {width} pixels, {scheme}"

@@ -1,4 +1,4 @@
-// What the page's writers give, to the letter.
+// The exact output of the page's writers.
 #include <cmath>
 #include <gtest/gtest.h>
 #include <limits>
@@ -13,7 +13,7 @@ namespace {
 
 constexpr double kNan = std::numeric_limits<double>::quiet_NaN();
 
-// The values of an attribute, one a line.
+// The values of an attribute, one per line.
 std::string attributes(const HtmlWriter& html, const std::string& name) {
   std::string found;
   const std::string begin = " " + name + "=\"";

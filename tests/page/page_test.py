@@ -12,7 +12,7 @@ from browser import Browser
 from device import LONG, SCRIPT, Device
 from inspection import TURNED, expect, inspect
 
-# The cells of a scalar by its key.
+# The cells of a scalar's row, by key.
 ROWS = """Object.fromEntries([...document.querySelectorAll('table[aria-label=Scalars] tbody tr')].map(
     row => [row.querySelector('bdi').textContent, [...row.cells].slice(1).map(c => c.textContent)]))"""
 
@@ -28,7 +28,7 @@ def check_content(browser):
                        (TURNED, [million, million, ""]), (LONG, [million, "not in it", ""]),
                        ("com.norvane.usage.disk.free_mib", [f"73{blank}520", "not in it", "MiB"])):
         expect(rows.get(key), cells, key[:40])
-    # The direction of a hostile key ends with it.
+    # The text direction of a hostile key does not extend beyond it.
     expect(browser.evaluate(f"""[...document.querySelectorAll('bdi')].filter(
         name => name.textContent === {TURNED!r}).length"""), 2, "isolated names")
     for words in ("About 3.8 years of operation at the pace of its life so far", "ACTV",

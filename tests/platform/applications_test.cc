@@ -80,7 +80,7 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   write("/var/lib/dpkg/status", "Package: a\nStatus: install ok installed\nArchitecture: all\n");
   write("/var/lib/apt/placeholder", "");
   const std::string states = root.path("/var/lib/apt/extended_states");
-  ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);  // read, it would wait for a writer for ever
+  ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);  // reading it would wait for a writer for ever
   EXPECT_EQ(bundles(), Lines{"a:all User"});
   EXPECT_EQ(log.lines, Lines{"cannot read " + states +
                              ": Invalid argument; packages that were installed "

@@ -32,7 +32,7 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
                                          {"no errno", plist::Dictionary{{"errno", 0}}},
                                          {"real", 1.5},
                                          {"vm.swapusage", 7}});
-  // The whole buffer is shown, in hexadecimal.
+  // The last column is the whole buffer, in hexadecimal.
   using Case = std::tuple<const char*, std::size_t, int, const char*>;
   for (const auto& [name, size, errorNumber, shown] :
        {Case("bytes", 4, 0, "010203ee"), Case("bytes", 2, ENOMEM, "eeee"),
@@ -56,7 +56,7 @@ TEST_F(ControlsTest, GivesRecordedValuesBeforeTheKernels) {
 }
 
 TEST_F(ControlsTest, ReadsSwapFromTheKernel) {
-  write(kControls, "<plist>");  // a file that cannot be used hides nothing
+  write(kControls, "<plist>");  // an unusable file hides nothing
   std::uint64_t kibibytes = 0;
   std::ifstream meminfo("/proc/meminfo");
   for (std::string word; meminfo >> word;) {

@@ -8,11 +8,11 @@ namespace {
 
 constexpr std::string_view kPattern = "yyyy-MM-dd HH:mm:ss Z";
 
-// One block of a zone file: UTC from the first instant that a word of that size holds.
+// One block of a zone file: UTC from the earliest instant that a word of this size can hold.
 std::string zoneBlock(std::size_t wordBytes) {
   std::string block("TZif2");
   block.resize(20);
-  for (const int count : {0, 0, 0, 1, 1, 4})  // the last: transitions, kinds of time, their names
+  for (const int count : {0, 0, 0, 1, 1, 4})  // at the end: transitions, kinds of time, their names
     block.append(3, '\0').push_back(static_cast<char>(count));
   block.append("\x80").append(wordBytes - 1, '\0');
   block.append(1, '\0');  // the first kind of time
@@ -20,13 +20,13 @@ std::string zoneBlock(std::size_t wordBytes) {
   return block.append("UTC\0", 4);
 }
 
-// A zone file in which `rule`, a zone in the form of POSIX, holds for all time.
+// A zone file in which `rule`, a zone in POSIX form, applies at all times.
 std::string zoneFile(std::string_view rule) {
   return zoneBlock(4).append(zoneBlock(8)).append("\n").append(rule).append("\n");
 }
 
 TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
-  // The instants are seconds since 1970, one of them in the year before year 1.
+  // Instants are seconds since 1970; one of them is in the year before year 1.
   static constexpr std::tuple<const char*, double, const char*, std::string_view> kCases[] = {
       {"UTC0", 1794852138.75, "2026-11-16 18:02:18 +0000", kPattern},
       {"<+0545>-5:45", 1794852138, "2026-11-16 23:47:18 +0545", kPattern},
@@ -41,7 +41,7 @@ TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
       {nullptr, 1e300, "292277026596 QQ'yyyMMM%d", "yyyy QQ'yyyMMM%d"},
       {nullptr, -1e300, "292277022658", "yyyy"}};
   for (const auto& [rule, instant, text, pattern] : kCases) {
-    const TemporaryRoot device;  // a file of its own for each zone
+    const TemporaryRoot device;  // a separate file for each zone
     device.write("/etc/localtime", rule ? zoneFile(rule) : "no zone file");
     LinuxDateFormatting formatting(device.root);
     EXPECT_EQ(formatting.format(plist::Date::since1970(instant), pattern, "en_US_POSIX"), text);

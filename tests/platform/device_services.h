@@ -1,4 +1,4 @@
-// A device root with the services over which most others are built.
+// A device root with the services that most others are built on.
 #pragma once
 
 #include <fcntl.h>
@@ -13,7 +13,7 @@
 
 namespace tavrel {
 
-/// Stands still: 2026-11-27 18:02:18.25 UTC until it is set.
+/// Stands still at 2026-11-27 18:02:18.25 UTC until it is set.
 class FixedClock final : public Clock {
  public:
   plist::Date now() override { return time; }
@@ -23,7 +23,7 @@ class FixedClock final : public Clock {
   plist::Date time = plist::Date::since1970(1'795'802'538.25);
 };
 
-/// Where no power goes, flushing only costs time.
+/// Skips flushing, which only costs time where no power can fail.
 class QuickFileSystem final : public FileSystem {
  protected:
   int syncFile(int) override { return 0; }

@@ -12,7 +12,7 @@ constexpr const char* kController = "/sys/devices/system/edac/mc/mc0/";
 
 struct EccDevice : DeviceServices {
   EccDevice() {
-    count("ce_count", 0);  // instead of the machine's own
+    count("ce_count", 0);  // used instead of the machine's own
     write("/sys/devices/system/edac/mc/mc0x/ce_count", "9\n");
   }
   void count(const char* file, std::uint64_t errors) const {
@@ -27,7 +27,7 @@ struct EccDevice : DeviceServices {
   std::vector<std::string> queue() { return *files.list(root.path(kQueue)); }
 };
 
-/// Everything up to the end: error numbers, and "identifier: registers" of events.
+/// Everything up to the end: error numbers, and events as "identifier: registers".
 std::string all(EccEvents& events) {
   std::string text;
   for (int reads = 0; reads < 20; ++reads) {
@@ -84,7 +84,7 @@ TEST(EccEvents, AreReadInOrderAndOnce) {
   EXPECT_EQ(all(events), "errno 16; 2:; 3:; ");
   EXPECT_EQ(device.queue(), (Lines{"03.event.unusable", "04.errno.unusable", "notes"}));
   EXPECT_EQ(device.log.lines, lines("it is set aside"));
-  device.event("00.event", 7);  // that arrives while the reader lives
+  device.event("00.event", 7);  // arrives during the reader's lifetime
   EXPECT_EQ(all(events), "7:; ");
   device.write(std::string(kQueue) + "05.event", "short");
   device.write(std::string(kQueue) + "05.event.unusable/in", "the way");
@@ -128,7 +128,7 @@ TEST(EccEvents, PublishWhatTheKernelHasCountedOnce) {
   EXPECT_EQ(all(first), "8:; 1: 0 5 5; 2: 0 1 1; 9:; ");
   EXPECT_EQ(all(first), "");
   device.count("ce_count", 7);
-  device.write(std::string(kController) + "ue_count", "?");  // unreadable this once
+  device.write(std::string(kController) + "ue_count", "?");  // unreadable just this once
   EXPECT_EQ(all(first), "1: 0 2 7; ");
   device.count("ue_count", 1);
   auto second = device.events();
@@ -151,7 +151,7 @@ TEST(EccEvents, AreKeptApartByBoots) {
     EXPECT_EQ(first[0], std::byte{8});
     events.filed();
   };
-  // What was remembered before boots were is of this one.
+  // Counters remembered by a version that did not note the boot count for this boot.
   device.write("/var/lib/tavrel/edac-counters.plist",
                *device.coding.encodeXml(plist::Dictionary{{"mc0/ce_count", 3}}));
   look("ffffffff", 5, "9");

@@ -28,7 +28,7 @@ struct LinuxEventLoopTest : testing::Test {
 };
 
 TEST_F(LinuxEventLoopTest, LastsItsFullTimeWithoutEvents) {
-  // Nor does a source that is ready but has nothing to do shorten the slice.
+  // A source that is ready but has nothing to do does not shorten the slice either.
   pipe.put();
   const auto source = loop.watch(pipe.reader.get(), [] { return Activity::Nothing; });
   ASSERT_TRUE(source);

@@ -1,4 +1,4 @@
-// A file system whose n-th call to the system goes wrong, and what a power cut leaves then.
+// A file system whose n-th system call fails, and the state that a power cut then leaves.
 #pragma once
 
 #include <cerrno>
@@ -17,15 +17,15 @@ class FaultyFileSystem final : public FileSystem {
  public:
   enum class Fault {
     Failure,           // the call fails as on a full disk; the calls after it work
-    FailureBeforeCut,  // the same, and at the end the power goes
-    Kill,              // the process ends there; what was written stays
-    Cut,               // the power goes; names and contents that were not flushed are lost
-    CutKeepingNames,   // the same, but the file system had written the names already
+    FailureBeforeCut,  // the same, and power fails at the end
+    Kill,              // the process dies there; what was written stays
+    Cut,               // power fails; names and contents not yet flushed are lost
+    CutKeepingNames,   // the same, but the file system had already written the names
   };
   static constexpr Fault kFaults[] = {Fault::Failure, Fault::FailureBeforeCut, Fault::Kill,
                                       Fault::Cut, Fault::CutKeepingNames};
 
-  /// What is below `folder` counts as flushed. Calls are counted from 1.
+  /// Everything below `folder` counts as flushed. Calls are counted from 1.
   FaultyFileSystem(const std::string& folder, Fault fault, int failingCall)
       : folder_(fs::canonical(folder)), fault_(fault), failingCall_(failingCall) {
     flushNames();
@@ -35,11 +35,11 @@ class FaultyFileSystem final : public FileSystem {
     }
   }
 
-  /// False when the sequence was over before the failing call.
+  /// False when the sequence ended before the failing call.
   bool hasStruck() const { return calls_ >= failingCall_; }
-  /// Whether the calls after the failing one work.
+  /// Whether calls after the failing one work.
   bool goesOn() const { return fault_ <= Fault::FailureBeforeCut; }
-  /// Brings the folder into the state in which it is found after the fault.
+  /// Puts the folder into the state in which it would be found after the fault.
   void settle() {
     if (fault_ == Fault::Failure || fault_ == Fault::Kill) return;
     if (fault_ == Fault::CutKeepingNames) flushNames();
@@ -48,7 +48,7 @@ class FaultyFileSystem final : public FileSystem {
       folders[inodeOf(path)] = path;
     std::map<fs::path, std::string> files;
     std::set<fs::path> keptFolders;
-    // Folders are walked from the top, parents before what they hold.
+    // Goes from the top down: parents before their contents.
     for (const auto& [path, names] : flushedNames_) {
       if (path != folder_ && !keptFolders.contains(path)) continue;
       for (const auto& [name, inode] : names) {
@@ -70,7 +70,7 @@ class FaultyFileSystem final : public FileSystem {
     if (strikes()) return -1;
     const bool isNew = (flags & O_CREAT) != 0 && inodeOf(path) == 0;
     const int descriptor = FileSystem::openFile(path, flags, mode);
-    // A new file may have the number of one that was removed.
+    // A new file may reuse the number of a removed one.
     if (isNew && descriptor >= 0) flushedContents_.erase(inodeOf(path));
     return descriptor;
   }

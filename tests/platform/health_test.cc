@@ -1,4 +1,4 @@
-// Health of drives: log pages, texts of sysfs, growth, and whole readings below a device root.
+// Health of drives: log pages, texts from sysfs, growth, and whole readings below a device root.
 #include <filesystem>
 #include <gtest/gtest.h>
 
@@ -72,7 +72,7 @@ TEST(HealthTest, RefusesShortAndLyingLogs) {
   EXPECT_EQ(nvmeSmartFigures(Bytes(512, std::byte{255})).error().message, "log 02h is blank");
   EXPECT_EQ(nvmeOcpFigures(smartPage()).error().message, "log C0h is not the one of OCP");
   Bytes page = smartPage();
-  put(page, 3, {101});  // more spare than there is
+  put(page, 3, {101});  // more spare than exists
   EXPECT_FALSE(valuesOf(*nvmeSmartFigures(page)).contains("spare_pct"));
   EXPECT_EQ(emmcFigures(Bytes(100)).error().message, "EXT_CSD has 100 bytes instead of 512");
   Bytes card(512);
@@ -96,7 +96,7 @@ TEST(HealthTest, OcpFieldsOfALaterVersion) {
   EXPECT_FALSE(second.contains("endurance"));  // not reported
 }
 
-// What the drive answered, in the library's form: pieces of a tag and a size, big-endian.
+// The drive's answer in the library's form: pieces of a tag and a big-endian size.
 TEST(HealthTest, AtaSmart) {
   const auto add = [](Bytes& blob, const char* tag, const Bytes& data) {
     for (int i = 0; i < 4; ++i)
@@ -106,8 +106,8 @@ TEST(HealthTest, AtaSmart) {
     blob.insert(blob.end(), data.begin(), data.end());
   };
   Bytes identify(512), data(512), thresholds(512);
-  put(identify, 164, {1});  // SMART is there
-  put(identify, 170, {1});  // and on
+  put(identify, 164, {1});  // SMART is supported
+  put(identify, 170, {1});  // and enabled
   const struct {
     unsigned id, flags, current, threshold, raw;
   } attributes[] = {{5, 1, 10, 36, 7},    {9, 0, 90, 0, 50},   {12, 0, 99, 0, 3},
@@ -221,11 +221,11 @@ class Answers final : public DeviceCommands {
   Expected<Bytes> ataSmart(const std::string&) override { return Bytes{}; }
 
   std::optional<Bytes> smart = smartPage(), ocp;
-  std::string killer = "none";  // the drive at which the reader ends
+  std::string killer = "none";  // the drive that kills the reader
   std::vector<std::string> asked;
 };
 
-// Takes readings, which are in memory, but no file on flash.
+// Accepts readings, which are in memory, but no file on flash.
 class FullFlash final : public FileSystem {
   int renameFile(const char* from, const char* to) override {
     if (!std::string_view(to).ends_with(kMemoryFile)) return FileSystem::renameFile(from, to);
@@ -254,7 +254,7 @@ class HealthReaderTest : public testing::Test, protected TemporaryRoot {
     return byName;
   }
 
-  /// As the daily run of a day leaves its state.
+  /// Leaves the state that the daily run of a day leaves.
   void run(std::int64_t day) const {
     write("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist",
           *plist::writeXml(plist::Dictionary{{std::string(kLastRunDayKey), day}}));
@@ -320,7 +320,7 @@ TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
   ASSERT_TRUE(readAll(2000));
   EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 3 * 512'000);
 
-  write("/sys/devices/pci/power/runtime_status", "suspended\n");  // what the drive hangs on
+  write("/sys/devices/pci/power/runtime_status", "suspended\n");  // the drive's parent device
   answers.asked.clear();
   ASSERT_TRUE(readAll(3000));
   EXPECT_TRUE(answers.asked.empty());

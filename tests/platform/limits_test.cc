@@ -1,4 +1,4 @@
-// The limits of what a device holds, and what goes when they are exceeded.
+// Limits on what a device holds, and what is removed when they are exceeded.
 
 #include <cstring>
 #include <numeric>
@@ -25,7 +25,7 @@ class LimitsTest : public testing::Test, protected DeviceServices {
   }
   TidyReport tidy() { return Tidy(root, files, coding, clock, preferences, store).run(); }
 
-  /// A scalar and a distribution with so many values on each day.
+  /// Records a scalar, and a distribution with `values` values, on each day.
   void record(const Days& days, std::size_t values = 5) {
     auto batch = store.beginBatch();
     ASSERT_TRUE(batch) << batch.error().message;
@@ -159,7 +159,7 @@ TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
     preferences.ZTXPreferencesSetValue(
         kLastRunDayKey, each.lastRun ? plist::Value(*each.lastRun) : plist::Value(), kTavrelDomain);
     EXPECT_EQ(tidy().failures, Lines{}) << each.what;
-    // The count of what went is of today.
+    // The count of removed items is dated today.
     Days left = daysHeld();
     EXPECT_EQ(left, each.left) << each.what;
   }
@@ -168,7 +168,7 @@ TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
 TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   setLastRun(kToday - 1);
   record(range(kToday - 99, kToday), 3000);
-  // As a killed erasure leaves it.
+  // The state that a killed erasure leaves.
   sql("CREATE TABLE erased (zeros BLOB); INSERT INTO erased VALUES (zeroblob(999999))");
   ASSERT_EQ(sql("PRAGMA auto_vacuum"), Lines{"2"});
   limit({{"Store", plist::Dictionary{{"Bytes", 1 << 20}}}});
@@ -181,7 +181,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.early_days"), report.kinds[0].removed - 10);
   EXPECT_GT(left.size(), 20U) << "no more than necessary";
   EXPECT_LE(fs::file_size(store.path()), (1U << 20) + (1U << 17) + 8192);
-  // What is left is whole.
+  // What remains is intact.
   EXPECT_EQ(sql("PRAGMA integrity_check"), Lines{"ok"});
   EXPECT_EQ(sql("SELECT count(*) FROM chunks"), Lines{std::to_string(left.size() * 6)});
   // Positions of segments belong to no day.
@@ -222,7 +222,7 @@ TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
   for (int commits = 0; commits < 3; ++commits)
     record({kToday - 2}, 400'000);
   record({kToday});
-  // A row that contradicts itself goes alone: its runs may be those of another.
+  // A row that contradicts itself is removed alone: its runs may belong to another row.
   sql("UPDATE distributions SET count = count + 1 WHERE day = " + std::to_string(kToday));
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_EQ(daysHeld(), Days{kToday});
@@ -327,7 +327,7 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.pending.logs"), 2);
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.records.files"), 1);
 
-  // The newest log stays, however small the limit; days count as bytes do.
+  // The newest log stays, however small the limit; the limit of days works like that of bytes.
   fileLog("log-tallied-20261127T000009Z-00000005", 400'000);
   fileLog("StorageStatus-20261126T000009Z-00000006", 1);
   limit({{"Pending", plist::Dictionary{{"Days", 1}}}});
@@ -366,7 +366,7 @@ TEST(LimitsFaults, LogsHaveTheirMetadataAfterEveryFault) {
             << name;
       }
       EXPECT_GE(logs, 2U);
-      // What was left behind goes a day later.
+      // Leftovers are removed a day later.
       auto later = KeptFiles::list(Kept::Pending, device.root, process.files, kToday);
       later->trim({2, 1 << 20}, 4'000'000'000);
       EXPECT_EQ(process.files.list(device.root.path(kPending))->size(), 4U);

@@ -1,4 +1,4 @@
-// Live services: sensors that block, files that stay open, recordings beside them, large tables.
+// Live services: sensors that block, files that stay open, recordings next to them, large tables.
 
 #include <ctime>
 #include <fcntl.h>
@@ -30,7 +30,7 @@ struct Subscribed {
       }
     }
   }
-  /// "NAME=VALUE " of those that have one after an update.
+  /// "NAME=VALUE " for each channel that has a value after an update.
   std::string update() {
     sampling->update();
     std::string text;
@@ -61,7 +61,7 @@ TEST(LiveMachineTest, ASensorThatBlocksHidesNoOther) {
   EXPECT_EQ(channels.update(), others);
   EXPECT_EQ(device.log.lines,
             Lines{path + " does not answer within 50 ms: left out until it does"});
-  // Nobody waits for it, or says so, again.
+  // Nobody waits for it again, or repeats the message.
   EXPECT_EQ(channels.update(), others);
   EXPECT_EQ(device.log.lines.size(), 1U);
   Descriptor(open(path.c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
@@ -76,11 +76,11 @@ TEST(LiveMachineTest, FilesStayOpen) {
   Subscribed channels(live);
   EXPECT_EQ(channels.update(), "boot.seconds=1 thermal_zone0.zone_temp=10 thermal.hottest=10 ");
   device.write(path, "11\n");
-  // A new file of the same name is not the one that is open.
+  // A new file of the same name is not the file that is open.
   std::filesystem::remove(device.root.path("/proc/uptime"));
   device.write("/proc/uptime", "2\n");
   EXPECT_EQ(channels.update(), "boot.seconds=1 thermal_zone0.zone_temp=11 thermal.hottest=11 ");
-  // A device that tells no more takes only its own channels with it.
+  // A device that no longer answers loses only its own channels.
   device.write(path, "");
   EXPECT_EQ(channels.update(), "boot.seconds=1 ");
 }
@@ -122,7 +122,7 @@ TEST(LiveMachineTest, ShowsTheInterfacesOfProcessOne) {
   EXPECT_EQ(shown(), "eth0.rx_bytes=3 eth0.rx_packets=4 ");
 }
 
-// Of drives, only what was read in this boot and within two days.
+// Only drive readings from this boot and the last two days count.
 TEST(LiveMachineTest, ShowsReadingsOfDrivesThatHold) {
   using namespace health;
   DeviceServices device;
@@ -151,7 +151,7 @@ TEST(LiveMachineTest, ShowsReadingsOfDrivesThatHold) {
   EXPECT_EQ(channels.update(),
             "nvme0.power_on_hours=8 nvme0.spare_pct=97 nvme0.written_growth=512000 "
             "nvme4.spare_pct=4 nvme4.written_growth=512000 ");
-  // A figure that a later reading lacks is unset, as are all of a drive that has gone.
+  // Figures that a later reading lacks are unset, as are all figures of a drive that is gone.
   writeReading("nvme0", "b1", 0, "", {{spare, 96}});
   std::filesystem::remove(device.root.path("/run/tavrel/health/nvme4.plist"));
   EXPECT_EQ(channels.update(), "nvme0.spare_pct=96 nvme0.written_growth=512000 ");
@@ -174,7 +174,7 @@ TEST(LiveMachineTest, ARecordedServiceTakesThePlaceOfALiveOne) {
   std::string name;
   while (const auto service = services->next())
     names += service->name(name) == kKernelSuccess ? name + ' ' : "? ";
-  // The second has the class of a live service, but not its name.
+  // The second one has the class of a live service, but a different name.
   EXPECT_EQ(names, "boot LinuxMemory memory IOReportHub ");
   EXPECT_EQ(registry.liveServices().size(), 1U);
   EXPECT_EQ(registry.recording().array("Services").size(), 2U);

@@ -1,4 +1,4 @@
-// The locks under which programs take turns: no other user can take one of them.
+// The locks with which programs take turns: no other user can hold one of them.
 
 #include <fcntl.h>
 #include <grp.h>
@@ -25,7 +25,7 @@ const std::string kEvents = "/var/lib/tavrel/ecc-events";
 
 struct LockTest : testing::Test, DeviceServices {};
 
-/// A process of another user that locks what it can open, until the end of the test.
+/// A process of another user that locks whatever it can open, until the test ends.
 class Hinderer {
  public:
   explicit Hinderer(const Lines& paths) {

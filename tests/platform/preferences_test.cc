@@ -10,7 +10,7 @@ namespace {
 constexpr std::string_view kDomain = "com.example.domain";
 constexpr std::string_view kFile = "/var/mobile/Library/Preferences/com.example.domain.plist";
 
-/// One process's view of a device's preferences.
+/// One process's view of the device's preferences.
 struct Process : ProcessServices {
   using ProcessServices::ProcessServices;
 
@@ -34,7 +34,7 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   EXPECT_EQ(here.get("a"), "(null)");
   const plist::Array list{1, 2};
   here.set("a", list);
-  plist::Array(list).append(3);  // the caller's own, before and after
+  plist::Array(list).append(3);  // only changes the caller's copies
   here.preferences.ZTXPreferencesGetValue("a", kDomain).array().append(4);
   EXPECT_EQ(here.get("a"), "[1, 2]");
   EXPECT_EQ(there.get("a"), "(null)");
@@ -43,7 +43,7 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   EXPECT_TRUE(there.synchronize());
   EXPECT_EQ(there.get("a"), "[1, 2]");
 
-  // Both write, each keeps the other's keys; removing is a change like others.
+  // Both write, and each keeps the other's keys; a removal is a change like any other.
   here.set("b", true);
   there.set("c", "text");
   there.set("a", {});
@@ -78,7 +78,7 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
 
 TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   const TemporaryRoot device;
-  fs::create_directories(device.root.path(kFile));  // a folder in the file's place
+  fs::create_directories(device.root.path(kFile));  // a folder where the file should be
   Process process(device.root);
   process.set("a", 1);
   EXPECT_FALSE(process.synchronize());
@@ -89,14 +89,14 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   fs::remove(device.root.path(kFile));
   EXPECT_TRUE(process.synchronize());
 
-  // One value without a form does not hold up the others.
+  // One value that cannot be encoded does not hold up the others.
   process.set("bad", plist::Date::sinceEpoch(std::nan("")));
   process.set("good", 2);
   EXPECT_TRUE(process.synchronize());
   EXPECT_EQ(process.log.lines.size(), 2U);
   EXPECT_EQ(process.all(), R"({"a":1,"good":2})");
 
-  // Nor one that is too large alone, nor several that are so together: the largest goes.
+  // Nor does one that is too large, nor several that are so together: the largest goes.
   process.set("good", std::string(1U << 20, 'x'));
   for (std::size_t i = 0; i < 9; ++i)
     process.set("large" + std::to_string(i), std::string((1000 + i) << 10, 'x'));
@@ -140,7 +140,7 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
     return done;
   };
   for (const bool corrupt : {false, true}) {
-    // What the file may hold after each step that was reported as done.
+    // What the file may hold after each step that reported success.
     const Lines states = corrupt ? Lines{"{}", R"({"a":"new"})", R"({"b":2})"}
                                  : Lines{R"({"a":"old","kept":1})", R"({"a":"new","kept":1})",
                                          R"({"b":2,"kept":1})"};

@@ -47,8 +47,8 @@ Dictionary service(std::string_view className, Dictionary more = Dictionary::cre
   return more;
 }
 
-// Names of the services that match; "!" behind them if the walk failed or its ground changed, a
-// code in their place if there was none.
+// Names of the matching services, followed by "!" if the walk failed or the registry changed, or
+// just a code if there was no walk.
 std::string walk(
     DriverRegistry& registry, const Dictionary& matching = Dictionary::create(),
     const std::function<void()>& midway = [] {}) {
@@ -75,7 +75,7 @@ std::vector<std::byte> interests(std::uint32_t count,
   return list;
 }
 
-// A connection with its calls in short.
+// A connection, with short forms of its calls.
 struct Client {
   explicit Client(DriverRegistry& registry, std::string_view className = "IOReportHub") {
     const auto service = registry.firstService(className);
@@ -94,12 +94,12 @@ struct Client {
     bufferID = scalarOutput[0];
     return client->mapMemory(static_cast<std::uint32_t>(bufferID), memory);
   }
-  /// What the mapping shows after an update, or the update's code.
+  /// The content of the mapping after an update, or the update's code.
   std::string update() {
     const auto code = call(3, {bufferID});
     return code ? format("%x", code) : show();
   }
-  /// "DRIVER/CHANNEL*COUNT=VALUE" of each group.
+  /// "DRIVER/CHANNEL*COUNT=VALUE" for each group.
   std::string show() const {
     std::string text;
     const ByteSpan bytes = memory->bytes();
@@ -234,7 +234,7 @@ TEST_F(RegistryTest, DriversAnswerWithTheFirstRowThatFits) {
                    std::size_t, const char*>
       kCases[] = {
           {8, bytesOf({13, 0, 0, 0, 1, 0}), 0, 4, 0, 4, "04000000"},
-          {8, bytesOf({13, 0, 0, 0, 1}), 0, 4, 0, 3, "010203ee"},  // too short to have flags
+          {8, bytesOf({13, 0, 0, 0, 1}), 0, 4, 0, 3, "010203ee"},  // too short to hold flags
           {8, bytesOf({13, 0, 0, 0, 0, 0}), 0, 2, kKernelUnderrun, 99, "eeee"},
           {8, bytesOf({255, 255, 255, 255}), 0, 4, kKernelError, 99, "eeeeeeee"},
           {8, bytesOf({13}), 0, 3, 0, 2, "0506ee"},
@@ -319,7 +319,7 @@ TEST_F(RegistryTest, TheHubFillsTheBufferInOrderOfInterest) {
                       "2/a*1=301 1/b*1=201 2/a*1=301 1/a*1=100 " + rest + "*2=0 ",
                       "2/a*1=301 1/b*2=202 2/a*1=301 1/a*1=100 " + rest + "*1=0 ",
                       "2/a*1=301 1/b*2=202 2/a*1=301 1/a*1=100 " + rest + "*1=0 "};
-  // The connection needs the registry no longer, nor does the mapping need the connection.
+  // The connection does not need the registry any more, nor does the mapping need the connection.
   Client second(*registry);
   registry.reset();
   for (const std::string& update : updates) {
@@ -329,7 +329,7 @@ TEST_F(RegistryTest, TheHubFillsTheBufferInOrderOfInterest) {
   EXPECT_EQ(client.call(3, {client.bufferID + (std::uint64_t{1} << 32)}), kKernelBadArgument);
   EXPECT_EQ(client.call(3, {client.bufferID + 1}), kKernelBadArgument);
 
-  // Each connection begins with the first groups; nothing known makes one element of no channel.
+  // Each connection begins with the first groups; unknown channels make one element of none.
   ASSERT_EQ(second.subscribe(interests(1, {{5, 5}})), 0U);
   EXPECT_EQ(second.update(), rest + "*1=0 ");
   const std::uint64_t earlier = second.bufferID;
@@ -351,7 +351,7 @@ TEST_F(RegistryTest, TheHubRefusesMalformedCalls) {
   const auto one = interests(1, {{1, 10}});
   auto reserved = one;
   reserved[7] = std::byte{1};
-  const auto tooMany = interests(0x0AAAAAABU, {{1, 10}});  // whose size is that of one modulo 2^32
+  const auto tooMany = interests(0x0AAAAAABU, {{1, 10}});  // its size is that of one, modulo 2^32
   auto refused = [index = 0](std::initializer_list<KernelReturn> codes) mutable {
     for (const KernelReturn code : codes)
       EXPECT_EQ(code, kKernelBadArgument) << index++;
@@ -370,7 +370,7 @@ TEST_F(RegistryTest, TheHubRefusesMalformedCalls) {
   EXPECT_EQ(client.scalarOutput[0], 77U);
   EXPECT_EQ(client.call(2, {}, interests(0, {}), 1), kKernelSuccess);
 
-  // The buffer has the largest size that a device may ask for, and no element more.
+  // The buffer has the largest size that a device may ask for, and not one element more.
   RecordedRegistry largeRegistry(
       hub({hubChannel(1, 1, group(1, 1, 0xFFFF, 0)), hubChannel(1, 2, group(1, 2, 1, 0))}), log);
   Client greedy(largeRegistry);
@@ -402,7 +402,7 @@ TEST_F(RegistryTest, TheHubRefusesWhatTheRecordingRefuses) {
   for (const char* refusal : {"OpenError", "MapError", "CloseError"})
     EXPECT_EQ(code(refusal, kKernelIOError), kKernelIOError) << refusal;
 
-  // What cannot be played is left out of the hub; without a hub there is no service of its class.
+  // Groups that cannot be played are left out of the hub; without a hub, its class has no service.
   Value tooFew = group(1, 1, 2, 0);
   storeLittle16(tooFew.data().bytes(), 20, 1);
   const Dictionary faulty =
@@ -460,18 +460,18 @@ TEST_F(RecordingFolderTest, FollowsItsFiles) {
   write("/var/lib/tavrel/registry/d.plist", "nonsense");
   EXPECT_EQ(walk(registry), "a b ");
   EXPECT_EQ(walk(registry), "a b ");
-  ASSERT_EQ(log.lines.size(), 2U);  // what is wrong is told once
+  ASSERT_EQ(log.lines.size(), 2U);  // each fault is reported once
   EXPECT_TRUE(log.lines[0].starts_with("cannot read " + path("d.plist") + ": "));
   EXPECT_TRUE(log.lines[1].starts_with(path("b.plist") + ": entry id 1 of a S is that of "));
 
-  // A walk keeps what it began with, and says whether the generation is still the same.
+  // A walk keeps the state it began with, and says whether the generation is still the same.
   EXPECT_EQ(walk(registry, all, [&] { record("e.plist", withService("e", 0)); }), "a b ");
   EXPECT_EQ(walk(registry, all, [&] { record("b.plist", withService("b2", 2)); }), "a b e !");
   EXPECT_EQ(walk(registry), "a b2 e ");
   std::filesystem::remove_all(root.path("/var/lib/tavrel/registry"));
   EXPECT_EQ(walk(registry), "");
 
-  // The generation of a dictionary that is played is seen at once.
+  // A new generation of a dictionary that is played shows at once.
   Dictionary played = withService("p", 1);
   RecordedRegistry player(played, log);
   const auto change = [&] {
@@ -536,7 +536,7 @@ TEST(RecordedHubTest, AChannelMayBeAbsentFromAnUpdate) {
   EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
   EXPECT_EQ(client.update(), "1/1*1=7 1/2*1=8 ");
   EXPECT_EQ(client.update(), "1/2*1=8 0/8000000000000000*1=0 ");
-  EXPECT_EQ(log.lines.size(), 1U);  // nothing but absences is no sequence
+  EXPECT_EQ(log.lines.size(), 1U);  // a list of absences only is not a sequence
 }
 
 }  // namespace

@@ -20,7 +20,7 @@ using Slice = EventLoop::Slice;
 constexpr std::string_view kName = "com.norvane.tallied.tavrel";
 constexpr int kAllSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
 
-/// A service below a root of its own that notes what its peers send.
+/// A service below its own root that notes what its peers send.
 class ServiceTest : public testing::Test {
  protected:
   void useRoot(const std::string& path) {
@@ -48,8 +48,8 @@ class ServiceTest : public testing::Test {
     if (!client) throw std::runtime_error(client.error().message);
     return *std::move(client);
   }
-  /// Runs the loop until nothing is ready any more; the number of events. What is no event ends an
-  /// empty slice too, so that several are needed to be sure.
+  /// Runs the loop until nothing more is ready, and returns the number of events. Activity that is
+  /// not an event also ends an empty slice, so only several empty slices are conclusive.
   int drain() {
     int events = 0;
     for (int idle = 0; idle < 16; ++idle) {
@@ -59,7 +59,7 @@ class ServiceTest : public testing::Test {
     }
     return events;
   }
-  /// Sends one packet as it is, with `files` passed along.
+  /// Sends one raw packet, passing `files` along.
   static void sendRaw(const ServiceClient& client, ByteSpan bytes, std::vector<int> files = {}) {
     iovec part{const_cast<std::byte*>(bytes.data()), bytes.size()};
     alignas(cmsghdr) char control[CMSG_SPACE(8 * sizeof(int))] = {};
@@ -99,7 +99,7 @@ class ServiceTest : public testing::Test {
 };
 
 TEST_F(ServiceTest, DeliversMessagesOfBothSizesAndEncodingsInOrder) {
-  // The second root makes paths that a socket address cannot hold.
+  // The second root makes paths too long for a socket address.
   for (const std::string& path : {folder, folder + "/" + std::string(150, 'r')}) {
     useRoot(path);
     listen();
@@ -112,7 +112,7 @@ TEST_F(ServiceTest, DeliversMessagesOfBothSizesAndEncodingsInOrder) {
       ASSERT_TRUE(client.send(large));
       sendRaw(client, asBytes(*plist::writeXml(plist::Dictionary{{"operation", 7}})));
     }
-    // The peer, three messages and the closure.
+    // The peer, three messages and the closing.
     EXPECT_EQ(drain(), 5);
     ASSERT_EQ(messages.size(), 3U) << testing::PrintToString(log.lines);
     EXPECT_EQ(messages[0].number("operation")->int64(), 0);
@@ -166,7 +166,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
     EXPECT_EQ(openDescriptors(), before) << "a passed descriptor stayed open";
   }
 
-  // From 20 lines a minute on they are counted instead.
+  // Beyond 20 lines a minute, they are only counted.
   for (int i = 0; i < 20; ++i) {
     sendRaw(connect(), asBytes("garbage"));
     drain();
@@ -222,7 +222,7 @@ TEST_F(ServiceTest, SilentPeersStopCountingAsEvents) {
 TEST_F(ServiceTest, RefusesOtherUsers) {
   if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
   listen();
-  // Against the mode of the file, so that the check of the credentials itself is met.
+  // Circumvents the mode of the file, so that the check of the credentials itself is reached.
   const std::string socket = serviceSocketPath(*root, kName);
   struct stat status;
   ASSERT_EQ(stat(socket.c_str(), &status), 0);
@@ -256,7 +256,7 @@ TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
   drain();
   EXPECT_EQ(messages.size(), 1U);
 
-  // A listener that does not hold the lock, as the service manager's.
+  // A listener that does not hold the lock, like that of the service manager.
   std::filesystem::remove(folder + "/run/tavrel/" + std::string(kName) + ".lock");
   log.lines.clear();
   EXPECT_TRUE(refusesToListen("another process listens there"));
@@ -266,7 +266,7 @@ TEST_F(ServiceTest, TakesThePlaceOfADeadServiceOnly) {
   EXPECT_TRUE(refusesToListen("the file there is not a socket; remove it"));
 }
 
-/// Runs in a process of its own whose descriptors 3 and 4 are `third` and `fourth`.
+/// Runs in a separate process, whose descriptors 3 and 4 are `third` and `fourth`.
 int takeOver(int third, int fourth, const char* process, const char* names,
              const std::function<bool()>& check) {
   const Descriptor a(fcntl(third, F_DUPFD, 100)), b(fcntl(fourth, F_DUPFD, 100));
@@ -280,7 +280,7 @@ int takeOver(int third, int fourth, const char* process, const char* names,
 TEST_F(ServiceTest, TakesOverTheServiceManagersSocket) {
   auto managers = ServiceSocket::open(*root, kName);
   ASSERT_TRUE(managers);
-  ASSERT_EQ(fcntl(managers->get(), F_SETFL, 0), 0);  // blocking, as it may be handed over
+  ASSERT_EQ(fcntl(managers->get(), F_SETFL, 0), 0);  // blocking, as it may be when handed over
   const Descriptor stream(socket(AF_UNIX, SOCK_STREAM, 0));
   ASSERT_TRUE(connect().send({{"operation", 5}}));
 
@@ -319,7 +319,7 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   notifications.post(kNotification);
   EXPECT_EQ(*notifications.waitBeyond(kNotification, 0, 1h), 1U);
 
-  // Another process posts while this one does and waits for the last of it.
+  // Another process posts while this one posts and waits for the last post.
   const pid_t other = fork();
   for (int i = 0; i < 200; ++i)
     notifications.post(kNotification);
@@ -330,7 +330,7 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   EXPECT_EQ(seen, 401U);
   waitpid(other, nullptr, 0);
 
-  // A damaged counter holds nobody up.
+  // A damaged counter does not block anybody.
   for (const char* const damaged : {"", "-1\n", "1111111111222222222233333333334444\n"}) {
     device.write("/run/tavrel/notifications/" + std::string(kNotification), damaged);
     log.lines.clear();

@@ -85,7 +85,7 @@ TEST_F(ServicesTest, CrashReportingKeepsRecordsPerTypeOfThirtyOneDays) {
             R"("te\"xt":"a\nb"}})"
             "\n");
 
-  // Of 32 days one goes: one that has not come, otherwise the oldest.
+  // One of 32 days is removed: one in the future, otherwise the oldest.
   Lines kept{"172-2026-11-27.jsonl", "172-2026-11-28.jsonl", "notes.txt", "x172-1999-01-01.jsonl"};
   for (int day = 1; day <= 29; ++day)
     kept.push_back(format("176-2026-01-%02d.jsonl", day));
@@ -114,7 +114,7 @@ TEST_F(ServicesTest, CrashReportingRollsTheSupportLog) {
     reporting.rollNorvaneCareLogs();
   }
   EXPECT_EQ(held(), "-fedcb-");
-  std::filesystem::remove(root.path(support + ".2"));  // as a roll that was cut short leaves it
+  std::filesystem::remove(root.path(support + ".2"));  // the state after an interrupted roll-over
   write(support, "g");
   reporting.rollNorvaneCareLogs();
   EXPECT_EQ(held(), "-gfdcb-");
@@ -190,12 +190,12 @@ TEST_F(ServicesTest, SystemLogSpeaksToTheJournalWhenTheStreamIsItsOwn) {
   EXPECT_EQ(packet.substr(0, 29), "PRIORITY=6\nSYSLOG_IDENTIFIER=");
   EXPECT_TRUE(packet.ends_with(std::string("\nMESSAGE\n\7\0\0\0\0\0\0\0one\ntwo\n", 25))) << packet;
 
-  // An entry beyond a datagram arrives as a file, without bytes of its own.
+  // An entry too large for a datagram arrives as a file, without bytes of its own.
   systemLog.write(LogLevel::Debug, std::string(16U << 20, 'x'));
   EXPECT_EQ(received(MSG_DONTWAIT), "");
   EXPECT_EQ(*FileSystem().read(root.path("/stream"), 100), "<3>one\n<3>two\n");
 
-  // What the system prints on standard error is an entry at debug level, without its line end.
+  // Standard error of the system becomes entries at debug level, without line ends.
   LinuxStandardStreams streams(systemLog);
   for (const char* text : {"no end", "an end\n"}) {
     streams.writeError(text);

@@ -17,7 +17,7 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   settle();
   const std::string whole = contentOf(store_->path());
   const std::string ofBad = " WHERE key = CAST('bad' || char(10) AS BLOB)";
-  // Whether a writer may append: it reads the row, but not the chunks.
+  // Whether a writer may append: it reads the row but not the chunks.
   const std::tuple<std::string, std::string, bool> cases[] = {
       {"UPDATE chunks SET data = x'00' WHERE chunk = 0",
        "its values are not in the form that this program writes", true},
@@ -111,7 +111,7 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
   EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 3}, {"k", kToday, 4}}));
   EXPECT_FALSE(std::filesystem::exists(kept));
 
-  // As a kill between the commit and the removal leaves it; more is kept before it is seen.
+  // The state after a kill between commit and removal; more is kept before anybody notices.
   write(std::string(kStorePath) + "-kept", content);
   keep("j", 5);
   store_->BHClientCheckpoint();
@@ -129,7 +129,7 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
     EXPECT_FALSE(std::filesystem::exists(kept));
     EXPECT_EQ(scalarsOfToday(), (Rows{{"j", kToday, 5}, {"k", kToday, 4}}));
   }
-  // What cannot be read is not replaced.
+  // An unreadable file is not replaced.
   std::filesystem::create_directory(kept);
   EXPECT_FALSE(KeptValues(store_->path()).add({{0, kToday, 1, "d"}}));
   EXPECT_TRUE(std::filesystem::is_directory(kept));
@@ -140,7 +140,7 @@ TEST_F(StoreTest, KeptValuesAreTakenInOnce) {
   store_->BHClientCheckpoint();
   EXPECT_EQ(scalarsOfToday().size(), 4U);
 
-  // What is kept between taking values in and their commit is not lost with them.
+  // Values kept between taking in earlier ones and the commit are not removed with those.
   keep("j", 6);
   keep("j", 7, true);
   EXPECT_TRUE(std::filesystem::exists(kept));
@@ -209,12 +209,12 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
       EXPECT_TRUE(store_->commit()) << "or kept";
     }
   }
-  // What was set while the store was another program's is still there for a store of our own.
+  // What was set while the store belonged to another program is still there for a store of our own.
   std::filesystem::remove(store_->path());
   EXPECT_TRUE(store_->commit());
   EXPECT_EQ(scalarsOfToday(), (Rows{{"new", kToday, 1}}));
 
-  // Who finds the damage second does not set the new store aside.
+  // A process that finds the damage second does not set the new store aside.
   const StoreSite site{store_->path(), std::make_shared<BusyBudget>(1), clock, preferences, log};
   EXPECT_FALSE(site.setAside(FileIdentity{1, 1}, {StoreFault::Damaged, "damaged"}));
   EXPECT_EQ(scalarsOfToday().size(), 1U);
@@ -241,7 +241,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
   EXPECT_EQ(contentOf(elsewhere), "");
 }
 
-/// While it lives, one read of SQLite fails, or all from it on.
+/// During its lifetime, one read of SQLite fails, or that one and all later ones.
 class FailingReads {
  public:
   FailingReads(int at, bool andLater) {
@@ -274,13 +274,13 @@ class FailingReads {
   static int read(sqlite3_file* file, void* into, int size, sqlite3_int64 offset) {
     ++reads_;
     const bool fails = reads_ == at_ || (andLater_ && reads_ > at_);
-    // What SQLite makes of EIO. Statements turn it into SQLITE_CORRUPT.
+    // What SQLite turns EIO into. Statements turn it into SQLITE_CORRUPT.
     return fails ? SQLITE_IOERR_CORRUPTFS : read_(file, into, size, offset);
   }
 
   static inline sqlite3_vfs* system_ = nullptr;
   static inline sqlite3_vfs vfs_{};
-  // The database's and the log's.
+  // those of the database and of the log
   static inline std::map<const sqlite3_io_methods*, sqlite3_io_methods> methods_;
   static inline decltype(sqlite3_io_methods::xRead) read_ = nullptr;
   static inline int at_ = 0, reads_ = 0;

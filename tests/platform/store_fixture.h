@@ -58,7 +58,7 @@ class StoreTest : public testing::Test, protected DeviceServices {
     ASSERT_TRUE((*batch)->commit());
   }
 
-  /// Runs SQL on the file as another program would; yields the first column of all rows.
+  /// Runs SQL on the file as another program would; returns the first column of all rows.
   Lines sql(const std::string& text) {
     sqlite3* handle = nullptr;
     EXPECT_EQ(sqlite3_open(store_->path().c_str(), &handle), SQLITE_OK);
@@ -72,7 +72,7 @@ class StoreTest : public testing::Test, protected DeviceServices {
     return column;
   }
 
-  /// Moves the log into the file and removes it, as the last connection of another program does.
+  /// Moves the log into the file and removes it, as another program's last connection does.
   void settle() { sql("PRAGMA wal_checkpoint"); }
 
   Lines setAsideFiles() {

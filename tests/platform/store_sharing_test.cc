@@ -24,7 +24,7 @@ TEST_F(StoreTest, TheClientCommitsAtTheCheckpointAndAtTheEnd) {
   const auto reader = open();
   EXPECT_EQ(scalars(*reader->initWithDefaultPath(), "", kSmallest, kLargest), Rows{});
 
-  // A reader at work keeps the log from being emptied, but not the values from being kept.
+  // An active reader keeps the log from being emptied, but not values from being kept.
   set({{"other", kToday, 9}});
   log.lines.clear();
   const auto impatient = open(1);
@@ -64,7 +64,7 @@ TEST_F(StoreTest, AnEmptiedLogKeepsItsFileAndWhatItHeldIsPast) {
   EXPECT_EQ(std::filesystem::file_size(file), kKeptLogBytes);
   set({{"k", kToday, 2}});
   EXPECT_TRUE(logHoldsPages(store_->path()));
-  // As after a power cut.
+  // The state after a power cut.
   std::filesystem::remove(store_->path() + "-shm");
   EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 2}}));
   store_->BHClientCheckpoint();
@@ -91,7 +91,7 @@ TEST_F(StoreTest, ValuesOutlastALock) {
   EXPECT_TRUE(impatient->commit());
   EXPECT_EQ(scalarsOfToday(), (Rows{{"k", kToday, 3}}));
 
-  // The time for waiting is spent once, whatever is waited for.
+  // The waiting time is spent only once, whatever is waited for.
   const auto budget = std::make_shared<BusyBudget>(20);
   const auto another = std::make_shared<BusyBudget>(20);
   const StoreFolderLock held(store_->path(), *another);
@@ -109,7 +109,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   const std::string folder = std::filesystem::path(store_->path()).parent_path();
   const std::string rootFolder = root.path("");
   ASSERT_EQ(chmod(rootFolder.c_str(), 0755), 0);
-  // Compares what a process sees that is restricted in some way.
+  // Compares the output of a process that is restricted in some way.
   const auto restricted = [](auto restriction, const std::string& expected, auto action) {
     const auto compare = [&] { return !restriction() ? 2 : action() == expected ? 0 : 1; };
     EXPECT_EQ(inChild(compare), 0) << expected;
@@ -137,7 +137,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
       " (Permission denied): check owner and permissions of the file and its folder";
   const std::string waits = "; 1 value is not kept yet: cannot write " + store_->path() + "-kept: ";
   const std::string denied = "Permission denied; run as root or as the owner of the files";
-  // There is no room for a single byte more.
+  // No room for a single further byte.
   const auto full = [] {
     const rlimit none{0, 0};
     return signal(SIGXFSZ, SIG_IGN) != SIG_ERR && setrlimit(RLIMIT_FSIZE, &none) == 0;
@@ -147,14 +147,14 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
       full,
       where() + "disk I/O error: check the file system that holds it" + waits + "File too large",
       writeAndTell);
-  // The log is left there with its index, which is read where it cannot be written.
+  // The log stays there with its index, which can be read where it cannot be written.
   const auto letOthersRead = [&] {
     for (const char* ending : {"", "-wal", "-shm"})
       EXPECT_EQ(chmod((store_->path() + ending).c_str(), 0644), 0);
   };
   letOthersRead();
   asAnother("k=1;", readAll);
-  // A writer that was alone leaves an empty index.
+  // The only writer leaves an empty index.
   const std::string index = store_->path() + "-shm";
   std::filesystem::remove(index);
   store_->BHClientSetValueForScalarKey("k", 1);
@@ -178,7 +178,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
                 "user who may write run 'tavrelctl stat list' once\n",
             readAll);
 
-  // While a writer has the log open, its index is there to be read with it.
+  // While a writer has the log open, its index is there for readers.
   ASSERT_EQ(chmod(folder.c_str(), 0755), 0);
   ASSERT_EQ(chmod(store_->path().c_str(), 0644), 0);
   std::filesystem::remove(store_->path() + "-wal");
@@ -229,7 +229,7 @@ TEST_F(StoreTest, ReadersThatChangeNothingLeaveNoTraceAndSayWhenWritersInterfere
 }
 
 TEST_F(StoreTest, NothingIsLostAmongWritersThatAreKilled) {
-  // Each transaction adds one to a scalar and three values to a distribution, then tells so.
+  // Each transaction adds one to a scalar and three values to a distribution, then reports success.
   const auto writeForEver = [this](int acknowledgements) {
     for (;;) {
       auto batch = store_->beginBatch();
@@ -250,8 +250,8 @@ TEST_F(StoreTest, NothingIsLostAmongWritersThatAreKilled) {
       if (writer == 0) writeForEver(ends[1]);
     }
     close(ends[1]);
-    // Killed at another place of a transaction each time; in the first rounds while the store is
-    // being made.
+    // Each round kills it at a different place of a transaction; the first rounds,
+    // while the store is being made.
     int acknowledged = 0;
     char byte;
     while (acknowledged < round % 7 && read(ends[0], &byte, 1) == 1)

@@ -12,7 +12,7 @@ namespace {
 
 TEST_F(StoreTest, WalksAndErasuresEndWhateverTheDaysAre) {
   set({{"a", kToday, 1}});
-  // As a damaged page may have it.
+  // The content that a damaged page may have.
   sql("DROP TABLE scalars;"
       "CREATE TABLE scalars (day, key, value, PRIMARY KEY (day, key)) WITHOUT ROWID;"
       "INSERT INTO scalars VALUES (0, x'62', 1), (1.5, x'41', 2), (3, x'61', 4)");
@@ -45,7 +45,7 @@ TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
   const auto history = store_->initWithDefaultPath();
   EXPECT_EQ(scalars(*history, "", kToday - 1, kToday), today);
 
-  // Bounds exclude the lower and include the upper day; several days come by key, then by day.
+  // The lower bound is exclusive, the upper inclusive; rows are sorted by key, then by day.
   using Case = std::tuple<std::string, std::int64_t, std::int64_t, Rows>;
   for (const auto& [prefix, min, max, rows] :
        {Case("a", kToday - 1, kToday, {today[2], today[3], today[4], today[5]}),
@@ -98,18 +98,18 @@ TEST_F(StoreTest, KeepsKeysAndValuesOfAnyKind) {
 }
 
 TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
-  // Signs, denormals, infinities and the bits of quiet and signalling not-a-numbers.
+  // Signs, denormals, infinities, and the bits of quiet and signalling not-a-numbers.
   constexpr std::uint64_t kSign = std::uint64_t{1} << 63, kInf = 0x7FF0000000000000;
   const auto patternOf = [](std::size_t i) {
     const std::uint64_t patterns[] = {0, kInf, kInf | 1, kInf | 8ULL << 48, 0x3FF0000000000001};
     return patterns[i % 5] ^ (i % 2 == 0 ? 0 : kSign) ^ (i % 3 == 0 ? 0x123 : 0);
   };
-  // Sizes of transactions around the size of a chunk; two keys mixed in each.
+  // Sizes of transactions around the size of a chunk, each with values of two keys.
   std::size_t total = 0;
   std::vector<std::size_t> sizes = {1, 2, 1020, 1, 1, 1023, 3000, 0, 1};
   sizes.resize(sizes.size() + 2100, 1);
   for (const std::size_t size : sizes) {
-    // As an earlier version made it; it is used as it is.
+    // A store made by an earlier version is used unchanged.
     if (size == 1023) sql("PRAGMA journal_mode = DELETE; PRAGMA page_size = 4096; VACUUM");
     auto batch = store_->beginBatch();
     ASSERT_TRUE(batch);
@@ -122,8 +122,8 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
     ASSERT_TRUE((*batch)->commit());
   }
   ASSERT_EQ(total, 7149U);
-  // Of each key: 9 chunks of the first transactions; of the others one of 1,024 values and one of
-  // 63, 31 of 32, and 22 of one. Each has its offsets in another row.
+  // For each key: 9 chunks from the first transactions; from the others one of 1,024 values, one of
+  // 63, 31 of 32, and 22 of one. The offsets of each are in another row.
   EXPECT_EQ(sql("SELECT count(*) FROM chunks; PRAGMA page_size"), (Lines{"256", "4096"}));
   {
     auto forgotten = store_->beginBatch();
@@ -148,7 +148,7 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
       });
   EXPECT_EQ(keys, (Lines{"d.one", "d.two"}));
 
-  // More than waits in memory.
+  // More than may wait in memory.
   auto batch = store_->beginBatch();
   const std::vector<Sample> many(700'000, Sample{1, 2});
   ASSERT_TRUE((*batch)->appendValues(kToday, "many", many));
@@ -161,7 +161,7 @@ TEST_F(StoreTest, KeepsEveryBitOfDistributionsInOrder) {
   EXPECT_EQ(found, many.size());
 }
 
-/// A store as version 1 of the schema left it: day 20784 with two distributions and two scalars.
+/// A store that version 1 of the schema left: day 20784 with two distributions and two scalars.
 constexpr const char* kVersion1 = R"(
 PRAGMA page_size = 65536;
 PRAGMA journal_mode = WAL;
@@ -242,7 +242,7 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
   store_->BHClientCheckpoint();
   EXPECT_EQ(sql("PRAGMA user_version"), Lines{"1"}) << "reading leaves it as it is";
 
-  // No byte can be written beyond the limit: the process is told, or killed at once.
+  // No byte can be written beyond the limit: the process gets an error, or is killed.
   int converted = 0, refused = 0;
   for (const bool isKilled : {false, true}) {
     for (rlim_t limit = 0; limit <= 1'300'000; limit += 50'000) {

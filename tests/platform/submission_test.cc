@@ -16,7 +16,7 @@ using Place = FileSubmission::Place;
 
 const std::string kContent(10'000, 'L');
 
-constexpr std::int32_t kToday = 20784;  // of the fixed clock
+constexpr std::int32_t kToday = 20784;  // the day of the fixed clock
 
 /// A store without rows.
 class DayStore final : public StatisticsStore {
@@ -184,7 +184,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
   const struct {
     bool isGiven;
     plist::Value firstDay;
-    std::int32_t day;  // whose rows the log is made of
+    std::int32_t day;  // the day of the log's rows
     const char* place;
     bool mayReportYesterday;
   } kCases[] = {
@@ -208,7 +208,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
     permit(device, given.isGiven, given.firstDay);
     Service service(device.root);
     EXPECT_EQ(service.submission.isDiagnosticSubmissionEnabled(), given.mayReportYesterday);
-    // The earliest day that was read decides.
+    // The earliest day read is decisive.
     for (const int later : {0, 1})
       if (given.day != kNoRows) service.readRowsOf(given.day + later);
     const std::string folder = device.root.path(kFolder + given.place);
@@ -226,7 +226,7 @@ TEST(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
   const TemporaryRoot device;
   Service service(device.root);
   for (int i = 0; i < 10; ++i) {
-    // At last the clock is lost.
+    // In the end the clock is lost.
     service.clock.time = plist::Date::since1970(i < 9 ? 1'795'802'538 + i : 5);
     ASSERT_TRUE(service.writeLog("S"));
   }

@@ -1,4 +1,4 @@
-// A device root in a temporary folder, a system log that is kept, and processes.
+// A device root in a temporary folder, a system log that keeps its lines, and child processes.
 #pragma once
 
 #include <algorithm>
@@ -26,7 +26,7 @@ inline std::string contentOf(const std::filesystem::path& path) {
   return {std::istreambuf_iterator<char>(file), {}};
 }
 
-/// Removed with everything in it at the end.
+/// Removes itself with all its contents at the end.
 class TemporaryRoot {
   const std::string folder_ = makeFolder();
 
@@ -48,7 +48,7 @@ class TemporaryRoot {
 
  private:
   static std::string makeFolder() {
-    // In memory where that can be had: tests flush and rename by the thousand.
+    // In memory where possible, because tests flush and rename thousands of times.
     const bool inMemory = access("/dev/shm", W_OK) == 0;
     const std::filesystem::path parent =
         inMemory ? "/dev/shm" : std::filesystem::temp_directory_path();
@@ -68,7 +68,7 @@ class KeptLog final : public SystemLog {
   Lines lines;
 };
 
-/// The exit status of `body` in a process of its own.
+/// The exit status of `body`, run in a separate process.
 inline int inChild(const std::function<int()>& body) {
   const pid_t child = fork();
   if (child == 0) _exit(body());

@@ -14,8 +14,8 @@ namespace {
 
 using namespace std::string_literals;
 
-// A document of objects given as bytes, with references of one byte and offsets of some; the first
-// object is the root, at offset 8.
+// A document of objects given as bytes, with references of one byte and offsets of `offsetWidth`;
+// the first object is the root, at offset 8.
 std::string document(const std::vector<std::string>& objects, std::size_t offsetWidth = 1) {
   std::string out = "bplist00";
   const auto appendOffset = [&out](std::string& to, std::size_t width) {
@@ -123,7 +123,7 @@ TEST(Binary, HostileObjectsAreRefused) {
   for (const auto& [objects, error] : rows)
     EXPECT_EQ(errorOf(document(objects)), "binary property list, offset " + error);
 
-  // As many values as there may be: the root, 9 arrays, and all that is in them.
+  // The maximum number of values: the root, 9 arrays, and all their elements.
   const std::string large = "\xAF\x12\x00\x01\xB2\x06"s + std::string(111'110, '\1');
   EXPECT_EQ(errorOf(document({"\xA9"s + std::string(9, '\2'), "\x09", large}, 4)), "no error");
 
@@ -162,7 +162,7 @@ TEST(Binary, HostileTrailersAreRefused) {
 }
 
 TEST(Binary, ContentThatIsReferredToManyTimesIsLimited) {
-  // One mebibyte of data, or of text, referred to 65 times; the value of all keys is `false`.
+  // One mebibyte of data or text, referenced 65 times; the value of all keys is `false`.
   const std::string references(65, '\1');
   const std::tuple<std::string, char, int> rows[] = {
       {"\xAF\x10\x41" + references, '\x4F', 76},

@@ -74,7 +74,7 @@ TEST(Xml, WhatXmlCannotHoldIsReplaced) {
   const auto text = writeXml("a\0b\x1B\xEF\xBF\xBE\xED\xA0\x80z"s);
   EXPECT_EQ(*text, wrapped("<string>a\uFFFDb\uFFFD\uFFFD\uFFFD\uFFFD\uFFFDz</string>\n"));
 
-  // Keys that become equal stay apart, also from a key that had the text before.
+  // Keys that become equal stay distinct, also from a key that already had that text.
   const Dictionary clash{{"k\x02", 2}, {"k\x01", 1}, {"k\uFFFD2", 3}, {"k", 0}};
   const Dictionary apart{{"k", 0}, {"k\uFFFD", 1}, {"k\uFFFD2", 3}, {"k\uFFFD3", 2}};
   const auto read = readXml(asBytes(*writeXml(clash)));
@@ -88,7 +88,7 @@ TEST(Xml, RefusesToWriteWhatCouldNotBeReadBack) {
     deepest = Array{deepest};
   Array cyclic{1};
   cyclic.append(cyclic);
-  // A log of many values is better written than lost; in binary they are limited.
+  // Better to write a log of many values than to lose it; the binary encoding limits them.
   Array wide{1, 2, 3, 4, 5, 6, 7, 8};
   for (int i = 0; i < 5; ++i)
     wide = Array{wide, wide, wide, wide, wide, wide, wide, wide};

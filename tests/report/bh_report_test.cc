@@ -56,7 +56,7 @@ TEST_F(BHReportTest, WritesALogWithExactlyItsEntries) {
   EXPECT_EQ(fake.log.messages(LogLevel::Info), Messages{"writing tallied log. yesterday=19999"});
 }
 
-// On every processor: whatever its order of bytes and the size of its words.
+// On every processor, whatever its byte order and word size.
 TEST_F(BHReportTest, ALogHasTheSameBitsEverywhere) {
   fake.store.scalars = {{"exact", kDay, 9'223'372'036'854'775'807}, {"raw", kDay, -(1LL << 62)}};
   std::vector<double> values{1e300, -0.0, 5e-324, 1e-300, 1e22, 10, 20};
@@ -175,7 +175,7 @@ TEST_F(BHReportTest, ReportsWhichStepFailed) {
   EXPECT_EQ(fake.log.messages(LogLevel::Error), Messages{"Failed to write tallied log"});
   EXPECT_TRUE(fake.preferences.domain(kTavrelDomain).contains("LastOSVersion"));
 
-  // An instant that no calendar reaches cannot be encoded.
+  // An instant beyond the calendar cannot be encoded.
   fake.clock.instant = plist::Date::sinceEpoch(1e300);
   fake.preferences.domain(kTavrelDomain).remove("LastOSVersion");
   fake.journal.clear();

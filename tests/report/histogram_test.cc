@@ -22,8 +22,8 @@ TEST(HistogramTest, PutsValuesWhereTheFirstBoundaryNotBelowThemStands) {
   EXPECT_EQ(determineHistBucketForValue(0, plist::Array{}), 0U);
 }
 
-// The prepared search and the plain walk agree, also for boundaries that are unordered, equal,
-// infinite, not-a-number, no numbers at all, or integers that a double cannot hold.
+// The prepared search and the plain walk agree, even for boundaries that are unordered, equal,
+// infinite, not-a-number, not numbers at all, or integers too large for a double.
 TEST(HistogramTest, SearchesAsTheWalkDoes) {
   const plist::Array kLists[] = {
       plist::Array::create(),
@@ -57,7 +57,7 @@ TEST(HistogramTest, LabelsTheBucketsThatCounted) {
             (Dictionary{{"(-inf, 10]", 2}, {"(12.5, 1e+300]", 1}, {"(1e+300, inf)", 4294967295}}));
   const std::uint32_t kOne[] = {3};
   EXPECT_EQ(histogramDictForIntervals(plist::Array{}, kOne), (Dictionary{{"(-inf, inf)", 3}}));
-  // Labels that are kept from other boundaries, equal in value only, are not given for these.
+  // Labels cached for other boundaries, which are equal only in value, are not used for these.
   HistogramLabels labels;
   const std::uint32_t kBoth[] = {1, 1};
   for (const auto& [boundary, text] : {std::pair<plist::Value, const char*>{1, "(-inf, 1]"},

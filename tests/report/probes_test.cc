@@ -15,7 +15,7 @@ constexpr const char* kDatabase = "/var/mobile/Library/Brimhold/BHDataStore.sqli
 struct ProbesTest : ::testing::Test {
   fakes::FakePlatform fake;
 
-  /// The log of a report with one scalar and the probes whose keys are whitelisted.
+  /// The log of a report with one scalar and those probes whose keys are whitelisted.
   Dictionary logWith(const Dictionary& probeKeys) {
     Dictionary keys = mutableCopy(probeKeys);
     keys.set("collected", Dictionary::create());
@@ -75,7 +75,7 @@ TEST_F(ProbesTest, TakeTheCorruptionCount) {
   const plist::Value three(3);
   preferences = {{"DatabaseCorruptionCount", 3}};
 
-  // Whatever of the library is missing, the count is left alone.
+  // Whatever part of the library is missing, the count is left alone.
   const std::tuple<bool, std::set<std::string, std::less<>>, Messages> kCases[] = {
       {false, {}, {"Failed to dynamically load the FaultlineSupport framework"}},
       {true,
@@ -98,7 +98,7 @@ TEST_F(ProbesTest, TakeTheCorruptionCount) {
   EXPECT_EQ(preferences.get("DatabaseCorruptionCount"), plist::Value(0));
   EXPECT_EQ(fake.journal,
             (fakes::Journal{"set com.norvane.tallied DatabaseCorruptionCount", "write log"}));
-  // Functions that were found are not looked for again.
+  // Functions that were found are not looked up again.
   const int loads = fake.loader.loads;
   EXPECT_EQ(probe(kCorruptions), plist::Value(0));
   EXPECT_EQ(fake.loader.loads, loads);

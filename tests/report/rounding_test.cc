@@ -5,7 +5,7 @@
 namespace tavrel {
 namespace {
 
-// The sum wraps beyond the largest integer.
+// The sum wraps around beyond the largest integer.
 TEST(RoundingTest, RoundsToBuckets) {
   using Case = std::tuple<std::uint32_t, std::int64_t, std::int64_t>;
   for (const auto& [width, value, rounded] :

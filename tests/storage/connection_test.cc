@@ -20,7 +20,7 @@ Dictionary with(const Dictionary& dictionary, const char* key, const Value& valu
   return copy;
 }
 
-// A driver that answers a size, and then each row of `fetch`.
+// A driver that answers a query of the size, and then each row of `fetch`.
 Dictionary sized(const Bytes& size, const Dictionary& fetch) {
   return driver({Dictionary{{"Method", 8}, {"Request", request(13, 1)}, {"Output", Data(size)}},
                  with(fetch, "Method", 8)});
@@ -58,7 +58,7 @@ TEST(ConnectionTest, FetchesStatistics) {
   fetch({sized(little32(0), {{"Output", Data(Bytes())}})}, false, "");
   fetch({sized(little32(3), {{"Output", Data(Bytes(3))}})}, false, "");
   fetch({sized(size, failing)}, false, "Could not retrieve data from driver for selector d\n");
-  // The answer may be shorter than was said; what is left out is not read.
+  // The answer may be shorter than announced; the missing part is not read.
   fetch({sized(little32(4096), whole)}, true, "", 77);
   fetch({sized(size, with(whole, "OutputLength", 16))}, true, "", 0);
   fetch({sized(size, with(whole, "OutputLength", 24))}, false, "", 0);

@@ -9,8 +9,8 @@ namespace {
 
 using fakes::FakeStreams;
 
-/// Which words the elements were taken from, "*n" for n elements that are 0; arrays that are all 0
-/// are left out. Word w of the block holds w + 1.
+/// Which words the elements came from, with "*n" for n elements that are 0; arrays of zeros are
+/// left out. Word w of the block holds w + 1.
 std::string described(const TelemetryCounters& counters) {
   std::string text;
   for (const CounterArrayShape& shape : kCounterArrays) {

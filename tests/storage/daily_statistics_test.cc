@@ -59,7 +59,7 @@ TEST(DailyStatisticsTest, LogsTenEccEventsAndReadsOneMore) {
       append64(bytes, i == 0 ? UINT64_MAX : i);
     return bytes;
   };
-  // The last column is the number that is logged as unexpected, -1 for none.
+  // The last column is the number logged as unexpected, -1 for none.
   using Case = std::tuple<std::size_t, int, std::size_t, std::size_t, int>;
   for (const auto& [pending, errorBehind, logged, left, number] :
        {Case(0, 2, 0, 0, -1), Case(3, 16, 3, 0, -1), Case(1, 5, 1, 0, 5), Case(10, 2, 10, 0, -1),

@@ -21,8 +21,8 @@ std::string item(std::uint32_t type, std::uint64_t flags, std::string_view paylo
 }
 
 // Items from words: "(1" and ")1" begin and end container 1, "nABC" is a thread name ("*" stands
-// for a zero byte), "s7" IO statistics, "-" ones without the counter, "a" an array item, "?" an
-// item that is cut, "." the end of the buffer, "x" an unfinished begin.
+// for a zero byte), "s7" are IO statistics, "-" those without the counter, "a" is an array item,
+// "?" a truncated item, "." the end of the buffer, "x" an unfinished begin.
 std::string items(const std::string& described) {
   std::istringstream stream(described);
   std::string out;
@@ -47,7 +47,7 @@ std::string items(const std::string& described) {
 }
 
 TEST(VMFreezer, FindsTheThreadsWrites) {
-  // What was written, empty for an error.
+  // The bytes written; empty for an error.
   using Case = std::pair<std::string_view, std::vector<const char*>>;
   const Case kCases[] = {
       {"123456", {"(1 (2 nVM_swapout s123456 )2 )1"}},
@@ -57,7 +57,7 @@ TEST(VMFreezer, FindsTheThreadsWrites) {
       {"4", {"(1 (1 )1 nVM_swapout s4 )1"}},
       {"2", {"(1 nVM_swapout s1 s2"}},
       {"3", {"(1 n s3 )1"}},
-      // An item that is cut ends every level, the end of the buffer one.
+      // A truncated item ends every level; the end of the buffer ends one.
       {"6", {"(1 (2 nother . nVM_swapout s6 )1"}},
       {"0",
        {"(1 nVM_swapout (2 nother ? )2 )1", "(1 s5 (2 nVM_swapout )2 )1",

@@ -19,7 +19,7 @@ Dictionary infoOf(const std::vector<Record>& records) {
   return CopyNANDInfo(platform.platform);
 }
 
-/// "suffix=number " for every entry, in their order.
+/// "suffix=number " for every entry, in order.
 std::string listed(const Dictionary& info) {
   std::string text;
   for (const auto& [key, value] : info) {
@@ -63,7 +63,7 @@ TEST(NandInfoTest, ReadsStatistics) {
   for (const auto& [own, suffix, value] :
        {Case({{56, {kEpoch}}}, kFormat, 0), Case({{56, {kEpoch + 604799}}}, kFormat, 0),
         Case({{56, {1}}}, kFormat, 0), Case({{56, {~0ULL}}}, kFormat, 30500568903377),
-        // None without both figures.
+        // No value unless both figures are there.
         Case({{86, {500}}}, kIntermediate, none),
         Case({{86, {500}}, {85, {0xFFFFFFFF}}}, kIntermediate, none),
         Case({{86, {500}}, {85, {501}}}, kIntermediate, -1),
@@ -101,7 +101,7 @@ TEST(NandInfoTest, MapsAllKeys) {
   std::string rows;
   for (const KeyMapRow& row : keyMap) {
     appendFormat(rows, "%s %s\n", row.name, row.suffix);
-    // The look-up finds what a walk from the front finds, also for a name that is cut.
+    // The look-up finds what a walk from the front finds, even for a truncated name.
     for (const auto name :
          {row.name, row.name.substr(1), row.name.substr(0, row.name.size() - 1)}) {
       const auto first = std::ranges::find(keyMap, name, &KeyMapRow::name);
@@ -111,7 +111,7 @@ TEST(NandInfoTest, MapsAllKeys) {
   EXPECT_EQ(fingerprint(rows), 0xB6F60D219004B5EBU);
   EXPECT_EQ(findKeyMapRow(""), nullptr);
 
-  // All statistics at once: all rows but the two of fragments, which no statistic has.
+  // All statistics at once: all rows except the two of fragments, which no statistic has.
   std::vector<Record> records;
   records.reserve(std::size(kStatisticKeys));
   for (const StatisticKey& row : kStatisticKeys)

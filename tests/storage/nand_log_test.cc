@@ -19,7 +19,7 @@ class NandLog : public testing::Test {
  protected:
   NandLog() { fake.clock.instant = start; }
 
-  // How many logs there are then.
+  // Returns the number of logs afterwards.
   std::size_t write(const Dictionary& statistics) {
     NLW_WriteLog(fake.platform, "165", statistics);
     return fake.submission.logs.size();
@@ -60,7 +60,7 @@ TEST_F(NandLog, WritesEveryFigureUnderAHeader) {
 TEST_F(NandLog, WaitsAWeekWhateverTheSubmissionSaid) {
   EXPECT_EQ(write({}), 0U);
   EXPECT_TRUE(fake.journal.empty());
-  preferences.set("SSLastLoggedAt", "2026-11-16");  // no date
+  preferences.set("SSLastLoggedAt", "2026-11-16");  // not a date
   fake.submission.fails = true;
   write(none);
   EXPECT_EQ(preferences.date("SSLastLoggedAt"), start);

@@ -10,7 +10,7 @@ namespace {
 
 using namespace fakes;
 
-/// "name=text", once the text was found to be the value's.
+/// "name=text", after checking that the text is the value's.
 std::vector<std::string> listed(const ASPContext& context) {
   std::vector<std::string> entries;
   forEachStatistic(context, [&](std::string_view name, const ASPValueEntry& entry) {
@@ -24,7 +24,7 @@ std::vector<std::string> listed(const ASPContext& context) {
 
 TEST(ParserTest, ParsesRecords) {
   const std::vector<Record> twice{{53, {6}}, {53, {7}}};
-  // `cut` bytes are taken off the end; `exportVersion` is 5 before the parse.
+  // `cut` bytes are removed from the end; `exportVersion` is 5 before the parse.
   using Case =
       std::tuple<std::vector<Record>, std::size_t, int, std::uint32_t, std::vector<std::string>>;
   for (const auto& [records, cut, result, exportVersion, entries] :
@@ -53,7 +53,7 @@ TEST(ParserTest, ParsesRecords) {
     EXPECT_EQ(listed(context), entries);
     EXPECT_EQ(context.driverVersion, 0xFFFFFFFF);
   }
-  // Counts that wrap when they are turned into bytes.
+  // Counts that overflow when converted to bytes.
   for (const std::uint64_t count : {0x1FFFFFFFULL, 0x20000000ULL, 0xFFFFFFFFULL}) {
     Bytes bytes;
     for (const std::uint64_t unit : {4 | count << 32, std::uint64_t{7}})
@@ -63,7 +63,7 @@ TEST(ParserTest, ParsesRecords) {
   }
 }
 
-// Every statistic with one value more than it may have.
+// Every statistic, with one value more than it may have.
 TEST(ParserTest, KnowsAllStatistics) {
   std::vector<Record> records;
   std::vector<std::string> expected;
@@ -102,7 +102,7 @@ TEST(ParserTest, KnowsAllStatistics) {
     EXPECT_EQ(context.driverVersion + context.hostWrites + context.readCountHisto[0], 0U);
   }
 
-  // Cut anywhere, the lists hold what was read before.
+  // Wherever the buffer is cut, the lists hold what was read before.
   for (std::size_t length = 0; length < 1000; ++length) {
     ASPContext part;
     ASPParseBufferToCxt(part, ByteSpan(bytes).first(length));

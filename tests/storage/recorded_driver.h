@@ -1,4 +1,4 @@
-// A storage driver of which a test says what it answers, and the buffers it answers with.
+// A storage driver whose answers a test defines, and the buffers that it answers with.
 #pragma once
 
 #include <string>

@@ -28,7 +28,7 @@ struct Field {
   const char* format;
 };
 
-// What is not read is all ones. The table stands behind the key or where `table` says.
+// Parts that are not read are all ones. The table is after the key, or at `table` if given.
 std::string descriptor(std::uint32_t version, std::uint32_t stride, std::uint32_t count,
                        const std::vector<Field>& fields, std::string key = {},
                        std::uint32_t table = 0) {
@@ -44,7 +44,7 @@ std::string descriptor(std::uint32_t version, std::uint32_t stride, std::uint32_
   return text;
 }
 
-// The text; nothing when the answer is 0.
+// The text; nothing when the result is 0.
 std::string render(std::string_view records, const std::string* by = nullptr) {
   std::string text(1 << 14, '#');
   std::size_t length = text.size();
@@ -54,7 +54,7 @@ std::string render(std::string_view records, const std::string* by = nullptr) {
   return text.substr(0, answer == 1 ? length : 0);
 }
 
-// Every word holds its own number but the first and the time in hysteresis.
+// Every word holds its own number, except the first and the time in hysteresis.
 std::string record(std::uint32_t timestamp) {
   std::string text = words({timestamp});
   for (std::uint32_t word = 1; word < 63; ++word)
@@ -115,7 +115,7 @@ TEST(Snapshot, PrintsFieldsByKindAndLeavesUnusedRecordsOut) {
     EXPECT_EQ(render(records, &by), std::string("%s%n ") + text);
   }
 
-  // Records that overlap, lie on each other, and end before what is not read of them.
+  // Records that overlap, coincide, or end before the part that is not read.
   const std::tuple<std::uint32_t, std::uint32_t, std::vector<Field>, const char*> placed[] = {
       {4, 3, {{0, 0, 0, "%u "}, {0, 4, 0, "%u"}}, "1 2\n2 0\n"},
       {0, 2, {{0, 4, 0, "%u"}}, "2\n2\n"},

@@ -33,7 +33,7 @@ struct Driver {
     method.set("Request", request(selector, flags));
     methods.append(method);
   }
-  /// The driver's service, and the one above it that has the device's characteristics.
+  /// The driver's service, and its parent, which has the device's characteristics.
   Array services(const Value& characteristics) const {
     Dictionary service = driver(methods);
     if (characteristics) service.set("Parents", Dictionary{{"IOService", 7}});
@@ -44,7 +44,7 @@ struct Driver {
 
 constexpr std::uint8_t kStatistics = 13, kBands = 11, kDefects = 15, kTelemetry = 17;
 
-// 2.5 block writes per host write, 0.75 within the intermediate bands.
+// 2.5 block writes per host write, 0.75 in the intermediate bands.
 const Bytes kStatisticsBuffer = statistics(
     {{49, {4096}}, {50, {1}}, {20, {5}}, {4, {2}}, {129, {3}}, {84, {9}}, {129, {1}}, {84, {1}}});
 
@@ -74,7 +74,7 @@ TEST(StructuredLogTest, LogsTheValidityListAboveTheThreshold) {
     EXPECT_EQ(platform.submission.logs[0].type, "165");
     EXPECT_TRUE(platform.submission.logs[0].content.ends_with(kText));
   }
-  // One byte less than the records need, counts that would wrap, no records, no header.
+  // One byte less than the records need, counts that would overflow, no records, no header.
   StoragePlatform platform(Array::create());
   gNeedValidityList = true;
   for (const Bytes& bad : {Bytes(list.begin(), list.end() - 1), words({1, ~0U, 0, 0, 0}),
@@ -94,7 +94,7 @@ TEST(StructuredLogTest, HasInfiniteAmplificationWithoutHostWrites) {
   DumpStorageStructuredLog(platform.platform, false);
   EXPECT_TRUE(gNeedValidityList);
   EXPECT_EQ(gCurrentSysWamp, 0);  // no size of the intermediate bands
-  // 1, which exceeds 0, but that is no threshold.
+  // 1 is greater than 0, but 0 is not a threshold.
   StoragePlatform one(
       {fakes::driver(answering(statistics({{49, {4096}}, {50, {1}}, {20, {5}}, {4, {5}}})))});
   one.preferences.domain("com.norvane.NANDInfo").set("userWAmp", 0.0);
@@ -126,7 +126,7 @@ TEST(StructuredLogTest, SaysWhatFails) {
     EXPECT_EQ(platform.streams.error, error);
   };
   run({}, {}, false, kStatisticsFailed + "failed to create dictionary");
-  // Queries that fail do not count; nor do fetches.
+  // Neither failed queries nor fetches count.
   run({}, characteristics, true, kStatisticsFailed + failedQueries({0, 1, 2, 3, 4}));
   Driver driver;
   driver.query(kBands, 0, {{"Output", Data(little32(0))}});
@@ -136,7 +136,7 @@ TEST(StructuredLogTest, SaysWhatFails) {
   run(driver, characteristics, false,
       kStatisticsFailed + "Could not malloc 4294967295 bytes" +
           "Could not retrieve data from driver for selector 17\n" + failedQueries({3}));
-  // What a driver's row has no getter for is not asked.
+  // Lists for which a driver's row has no getter are not requested.
   {
     StoragePlatform platform(driver.services(characteristics));
     EXPECT_TRUE(logStorageLists(platform.platform, *platform.drivers.firstService("ASPStorage"),
@@ -150,7 +150,7 @@ TEST(StructuredLogTest, SaysWhatFails) {
                                   .defectsList = []() -> const SelectorTable* { return nullptr; }},
                                  false));
   }
-  // The caller's flag goes along with both steps.
+  // The caller's flag is passed in both steps.
   Driver flagged;
   flagged.answer(kStatistics, kStatisticsBuffer);
   flagged.query(kDefects, 2, {{"Output", Data(little32(12))}});
@@ -199,7 +199,7 @@ TEST(StructuredLogTest, RefusesTelemetryThatItCannotPlace) {
 }
 
 TEST(StructuredLogTest, FilesOneRecordPerChannel) {
-  // Word n of channel c's block is 1000 c + n, field n of its record 100 c + n.
+  // Word n of channel c's block is 1000 c + n; field n of its record is 100 c + n.
   constexpr std::uint32_t kChannels = 2;
   std::vector<std::uint32_t> values;
   for (std::uint32_t word = 0; word < kChannels * 1024; ++word)
@@ -207,7 +207,7 @@ TEST(StructuredLogTest, FilesOneRecordPerChannel) {
   for (std::uint32_t field = 0; field < kChannels * 8; ++field)
     values.push_back(100 * (field / 8) + field % 8);
   const Bytes list = words(values);
-  // The number of entries of the second channel's record, and some of them.
+  // The number of entries in the second channel's record, and some of them.
   const auto filed = [&](const char* chip, std::initializer_list<const char*> keys) {
     StoragePlatform platform(Array{});
     const Dictionary characteristics{
@@ -232,7 +232,7 @@ TEST(StructuredLogTest, FilesOneRecordPerChannel) {
 TEST(StructuredLogTest, FilesDefectsThatLieInTheBuffer) {
   Bytes list = words({0, 3, 2, 0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB,  //
                       0xFFFF'0001, 2, 0xFFFF'FFFF, 4, 5, 6, 0xFFFF'FFFB});
-  list.pop_back();  // the second lies in it but for one byte
+  list.pop_back();  // all but one byte of the second is in the buffer
   StoragePlatform platform(Array{});
   EXPECT_TRUE(logDefectsList(platform.platform, list, {}));
   EXPECT_TRUE(logDefectsList(platform.platform, words({0}), {}));

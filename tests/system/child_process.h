@@ -1,4 +1,4 @@
-// Processes that a test starts, watches and kills.
+// Processes that a test starts, observes and kills.
 #pragma once
 
 #include <cstdlib>
@@ -10,7 +10,7 @@
 
 namespace tavrel {
 
-/// Becomes the built daemon, on the device below `root`.
+/// Turns this process into the built daemon, on the device below `root`.
 [[noreturn]] inline void executeBelow(const std::string& root, const char* argument) {
   ::setenv("TAVREL_ROOT", root.c_str(), 1);
   ::execl(TAVREL_BINARY, "tavrel", argument, nullptr);

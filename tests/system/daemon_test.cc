@@ -1,4 +1,4 @@
-// The daemon as a process, on a device of its own.
+// The daemon as a process, on a separate device.
 #include <array>
 #include <sstream>
 
@@ -41,7 +41,7 @@ std::string loggedIn(const std::string& errors) {
   return log;
 }
 
-/// Runs the built program and yields what it logged.
+/// Runs the built program and returns what it logged.
 std::string logBelow(const std::string& root, const char* argument, const std::string& errors) {
   EXPECT_EQ(waitFor(forkProcess([&] { executeBelow(root, argument); }, errors)), 0);
   return loggedIn(errors);
@@ -74,7 +74,7 @@ struct Device : TemporaryRoot {
     linuxPlatform.preferences().ZTXPreferencesSetValue("DiagnosticSubmissionEnabled", true,
                                                        "com.norvane.zentrix");
     const Dictionary setting{{"Domain", "com.example"}, {"Key", "k"}, {"Value", 7}};
-    // Only the owner gives the permission, or takes it.
+    // Only the owner grants or withdraws the permission.
     const Dictionary withdrawal{{"Domain", "com.norvane.zentrix"},
                                 {"Key", "DiagnosticSubmissionEnabled"}};
     platform.preferences->ZTXPreferencesSetValue(
@@ -89,7 +89,7 @@ struct Device : TemporaryRoot {
     EXPECT_TRUE((*batch)->commit());
   }
 
-  /// The pending daily logs; each must be whole and have its metadata. NAND logs too must be.
+  /// The pending daily logs, which must be whole and have metadata; so must NAND logs.
   std::vector<Dictionary> pendingLogs() const {
     LinuxPlatform linuxPlatform(root);
     const auto filed = linuxPlatform.submission().logs(FileSubmission::Place::Pending);
@@ -113,7 +113,7 @@ struct Device : TemporaryRoot {
     return logs;
   }
 
-  /// The ECC events that were filed as records, which must be whole lines, and those that wait.
+  /// The ECC events filed as records, which must be whole lines, plus those that wait.
   int eccEvents() const {
     int count = 0;
     for (const auto& entry : std::filesystem::recursive_directory_iterator(root.path("/var"))) {
@@ -195,7 +195,7 @@ TEST(DaemonTest, RemembersWhetherARunFinished) {
   EXPECT_EQ(done->task, "forced");
   EXPECT_EQ(done->lastFinished, done->ended);
 
-  // A run with nothing to do leaves the record alone, and one that cannot write it goes on.
+  // A run with nothing to do leaves the record alone; one that cannot write it continues.
   const std::string before = contentOf(device.root.path(kLastRunFile));
   device.logOf("-d");
   EXPECT_EQ(contentOf(device.root.path(kLastRunFile)), before);
@@ -336,8 +336,8 @@ TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
     EXPECT_TRUE(device.preference("com.shared", std::to_string(key))) << key;
 }
 
-// A run is killed before one of its system calls, over the whole run; the next one must then find
-// and leave everything whole. A log may have been filed by both.
+// Kills a run before one of its system calls, at moments spread over the whole run. The next run
+// must find and leave everything intact. Both may have filed a log.
 TEST(DaemonTest, RecoversWhereverARunIsKilled) {
   std::size_t kills = 0;
   for (std::size_t calls = 0;; calls += 7) {
@@ -352,7 +352,7 @@ TEST(DaemonTest, RecoversWhereverARunIsKilled) {
     EXPECT_EQ(device.preference("com.example", "k"), plist::Value(7));
     EXPECT_EQ(device.scalars("com.norvane.").size(), 335U);
     const int repeated = device.eccEvents() - kEccEvents;
-    EXPECT_TRUE(repeated == 0 || repeated == 1) << repeated;  // filed, and not out of the queue yet
+    EXPECT_TRUE(repeated == 0 || repeated == 1) << repeated;  // filed, but still in the queue
     const std::size_t logs = device.pendingLogs().size();
     EXPECT_TRUE(logs == 1 || logs == logsBefore + 1) << logs;
   }

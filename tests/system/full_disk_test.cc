@@ -32,7 +32,7 @@ struct SmallDisk {
   void leaveFree(std::int64_t kibibytes) const {
     const Descriptor file(::open(filler.c_str(), O_WRONLY | O_CREAT, 0600));
     std::int64_t size = 0;
-    for (int attempt = 0; attempt < 8; ++attempt) {  // what the filler itself costs is seen by then
+    for (int attempt = 0; attempt < 8; ++attempt) {  // by then, the cost of the filler itself shows
       struct statvfs status {};
       ASSERT_EQ(::statvfs(path.c_str(), &status), 0);
       const std::int64_t excess = static_cast<std::int64_t>(status.f_bavail) - kibibytes;
@@ -49,7 +49,7 @@ struct SmallDisk {
   bool isMounted = false;
 };
 
-// At some of these sizes SQLite would write into a hole of its index and be killed by SIGBUS.
+// At some of these sizes, SQLite would write into a hole of its index and be killed by SIGBUS.
 TEST(FullDiskTest, NoSignalEndsARunAndNothingIsLost) {
   constexpr int kEvents = 2;
   int kept = 0;
@@ -82,7 +82,7 @@ TEST(FullDiskTest, NoSignalEndsARunAndNothingIsLost) {
     EXPECT_EQ(run(), 0);
     LinuxPlatform(root).platform().statistics->BHClientCheckpoint();  // as the next day's run does
     EXPECT_EQ(scalars(), 2);
-    std::ptrdiff_t events = 0;  // that wait or are filed
+    std::ptrdiff_t events = 0;  // waiting or filed
     for (const auto& entry : std::filesystem::recursive_directory_iterator(root.path("/var"))) {
       const std::string name = entry.path().filename();
       if (name.ends_with(".event")) ++events;

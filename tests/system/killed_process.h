@@ -1,4 +1,4 @@
-// Processes that are forked and, some of them, killed before a system call.
+// Forked processes, some of which are killed before a system call.
 #pragma once
 
 #include <cstddef>
@@ -12,7 +12,7 @@
 
 namespace tavrel {
 
-/// Runs `body` in a forked process with its standard error in `errorFile`; yields the process.
+/// Runs `body` in a forked process with standard error in `errorFile`; returns the process id.
 inline int forkProcess(const std::function<void()>& body,
                        const std::string& errorFile = "/dev/null") {
   const int child = ::fork();
@@ -24,8 +24,8 @@ inline int forkProcess(const std::function<void()>& body,
 }
 
 /// Runs `body` in a forked process that is killed before its system call number `calls`. With
-/// `meanwhile`, it is not: it waits there for that and then goes on to its end. False when it ended
-/// before that call.
+/// `meanwhile`, it is not killed: it pauses there while `meanwhile` runs, and then continues to its
+/// end. False when it ended before that call.
 inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& body,
                                const std::function<void()>& meanwhile = {}) {
   const int child = forkProcess([&] {
@@ -35,7 +35,7 @@ inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& b
   });
   int status = 0;
   ::waitpid(child, &status, 0);
-  // Every call stops the process twice: before it and after it.
+  // Every call stops the process twice: before and after.
   for (std::size_t stop = 0; stop < 2 * calls + 1; ++stop) {
     ::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr);
     ::waitpid(child, &status, 0);

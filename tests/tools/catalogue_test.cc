@@ -1,4 +1,4 @@
-// The catalogue: lookups, that nothing is missing in it, and documents that the build refuses.
+// The catalogue: look-ups, its completeness, and documents that the build rejects.
 
 #include "catalogue/catalogue.h"
 
@@ -107,7 +107,7 @@ TEST(CatalogueTest, HasWhatTheControllerReports) {
   }
 }
 
-// Keys of statistics are literals in these folders, and stand between preference domains.
+// In these folders, keys of statistics are literals, as are preference domains.
 TEST(CatalogueTest, HasWhatIsRecorded) {
   const std::set<std::string> others = {"com.norvane.NANDInfo",
                                         "com.norvane.NANDInfo.Error",
@@ -206,7 +206,7 @@ TEST(CatalogueTest, RefusesBrokenDocuments) {
                                         "/catalogue/rows.cmake 2> %s",
                            documents.string(), rows, log)
                         .c_str());
-    // CMake breaks long lines.
+    // CMake wraps long lines.
     const std::string said = std::regex_replace(textOf(log), std::regex("\\s+"), " ");
     EXPECT_EQ(WEXITSTATUS(status), fault.empty() ? 0 : 1) << said;
     const std::string where = fault.empty() ? "" : (documents / "t.md:").string() + fault + " ";

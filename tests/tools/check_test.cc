@@ -25,7 +25,7 @@ std::string isoAgo(double seconds) {
   return isoDateText(plist::Date::sinceEpoch(std::floor(ago(seconds).secondsSinceEpoch())));
 }
 
-/// A name of a log that was filed so long ago.
+/// The name of a log that was filed `seconds` ago.
 std::string logName(double seconds) {
   std::string stamp = isoAgo(seconds);
   std::erase_if(stamp, [](char c) { return c == '-' || c == ':'; });
@@ -35,7 +35,7 @@ std::string logName(double seconds) {
 struct CheckTest : testing::Test {
   const TemporaryDevice device;
 
-  /// The line of one check, without what its text has of times.
+  /// Expects the line of one check, without the times in its text.
   void expect(const std::string& line, int status) const {
     const Outcome outcome = device.run("status --check");
     EXPECT_EQ(outcome.status, status) << outcome;
@@ -116,7 +116,7 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   expect("WARNING permission: DiagnosticSubmissionEnabled is a string, which counts as no", 1);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
   expect("OK permission: the daily log may leave the device\n", 1);
-  for (const char* junk : {"", "<plist>"}) {  // no whitelist, and none that can be used
+  for (const char* junk : {"", "<plist>"}) {  // no whitelist, then an unusable one
     if (*junk != 0) device.write(kWhitelistFile, junk);
     expect("WARNING last-log: the next run: no log for day", 1);
   }

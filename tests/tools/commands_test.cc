@@ -49,7 +49,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   EXPECT_EQ(device.runAt("", "status"),
             fails("--root: names no folder: see 'tavrelctl status --help'", 2));
   EXPECT_FALSE(std::filesystem::exists(none));
-  // The journal takes the priority of a line from its beginning.
+  // The journal takes the priority of a line from its first characters.
   const std::pair<std::vector<std::string>, std::string> kJournal[] = {
       {{"prefs", "set", "a", "k", "true"},
        "<4>tavrelctl: stored as a string: true: use --bool for a boolean\n"},
@@ -141,7 +141,7 @@ TEST(Plist, ConvertsBetweenAllForms) {
                "[1,");
 }
 
-// A whitelist, and a day's statistics of which one scalar may not leave.
+// A whitelist, and a day's statistics including one scalar that may not leave.
 void fill(const TemporaryDevice& device) {
   device.write(kWhitelistFile, xmlOf(R"({"G": {
       "ScalarKeys": {"app.starts": {"sig_fig": 2},
@@ -190,7 +190,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
       << verbose.error;
   EXPECT_EQ(device.files(), before);
 
-  // What a failure makes incomplete fails.
+  // Output that a failure makes incomplete counts as a failure.
   const std::string preferences = device.path("/var/mobile/Library/Preferences/");
   const std::string kept = contentOf(preferences + "com.norvane.tallied.plist");
   std::ofstream(preferences + "com.norvane.tallied.plist") << "junk";
@@ -289,7 +289,7 @@ TEST(LogShow, DrawsTheTableOfASubmittedLog) {
                       "-                19 bytes  pending  StorageStatus-a.log\n"
                       "2024-10-04        1.4 KiB  pending  log-tallied-b.log\n"),
                "", 40);
-  // A folder is no log, whatever its name.
+  // A folder is not a log, whatever its name.
   std::filesystem::create_directories(pending + "folder.log");
   device.check("log show", prints("Log           " + pending + R"(log-tallied-b.log (pending)
 Type          193
@@ -349,7 +349,7 @@ line two
   EXPECT_EQ(json["distributions"]["app.none"]["standard_deviation"], nullptr);
   EXPECT_EQ(json["faults"].dump(), "[]");
 
-  // Of two logs of one second the one that was written later is the latest.
+  // Of two logs from the same second, the one written later is the latest.
   const std::string other = pending + "log-tallied-b.metadata.plist";
   device.write(kSubmission + "pending/log-tallied-a.log", xmlOf(R"json({
     "BHScalars": "x", "BHOther": 1, "BHDistributions": {"a": [{"$real": "nan"}, 1, 1, 1, 0], "b": 1},
@@ -372,7 +372,7 @@ line two
             std::string::npos);
   device.check("log show " + other,
                fails("not a tallied log: " + other + ": 'tavrelctl plist show FILE' shows it"));
-  // Only a forced run reports the day on which it files.
+  // Only a forced run reports the day on which it files the log.
   device.fileLog("pending/log-tallied-c", log,
                  R"({"LogName": "log-tallied", "Time": {"$date": "2024-10-04T23:59:59Z"}})");
   std::string days;

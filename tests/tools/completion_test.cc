@@ -1,4 +1,4 @@
-// Completions and the manual page, which are made of the tool's commands.
+// Completions and the manual page, which are generated from the tool's commands.
 #include <set>
 
 #include "device.h"
@@ -8,8 +8,8 @@ namespace {
 
 using Words = std::set<std::string>;
 
-/// What bash completes at the end of a command line, with the built tool in PATH. As bash does, the
-/// script takes words apart at colons and equals signs.
+/// What bash completes at the end of a command line, with the built tool in PATH. Like bash, the
+/// script splits words at colons and equals signs.
 Words completeInBash(const TemporaryDevice& device, const std::string& line) {
   device.write("/line.bash",
                "export PATH=" TAVREL_BUILD "/bin:$PATH TAVREL_ROOT=" + device.path("") +
@@ -32,7 +32,7 @@ Words completeInBash(const TemporaryDevice& device, const std::string& line) {
   return words;
 }
 
-/// The commands that the help of `path` lists, and the options.
+/// The commands and options that the help of `path` lists.
 struct Help {
   Words commands, options;
 
@@ -44,7 +44,7 @@ struct Help {
       std::istringstream words(line);
       std::string word;
       words >> word;
-      // Deeper than this are only descriptions.
+      // Lines that are indented further are only descriptions.
       if (!line.starts_with("  ") || line.find_first_not_of(' ') > 6) continue;
       if (isOfCommands) commands.insert(word);
       for (std::istringstream names(word); std::getline(names, word, ',');)
@@ -67,7 +67,7 @@ void expectAll(const TemporaryDevice& device, const std::string& path, int& comm
       expectAll(device, path.empty() ? command : path + " " + command, commands);
     return;
   }
-  // In the manual page: the usage, and each option in it.
+  // The manual page has the usage, with each option in it.
   const std::string page = contentOf(TAVREL_BUILD "/man/tavrelctl.1");
   const std::size_t at = page.find("\n\\fB" + path);
   ASSERT_NE(at, page.npos) << path;

@@ -25,7 +25,7 @@ struct Consent : testing::Test {
     for (const char* name : names)
       device.fileLog(name, "text", "{}");
   }
-  /// Logs that can be seen, each of which must have its metadata.
+  /// Visible logs, each of which must have its metadata.
   std::size_t visibleLogs() const {
     std::size_t count = 0;
     for (const char* place : {"pending", "outbox"}) {
@@ -67,7 +67,7 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
       {0, "submission is " + allowed(today - 1) + "\n",
        "tavrelctl: this includes what is already recorded, from day " + text(today - 1) + " on\n"});
 
-  // A clock that is behind what is recorded.
+  // A clock that is behind the recorded statistics.
   device.run("deny");
   device.run("stat import", format("scalar\t%d\tk\t1\n", today + 5));
   EXPECT_NE(device.run("allow --json").error.find("submission begins after it"), std::string::npos);

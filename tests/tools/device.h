@@ -1,4 +1,4 @@
-// A device in a temporary folder, and tavrelctl on it.
+// A device in a temporary folder, with tavrelctl to operate it.
 #pragma once
 
 #include <algorithm>
@@ -24,7 +24,7 @@ inline constexpr const char* kWhitelistFile =
     "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
 inline const std::string kSubmission = "/var/mobile/Library/Logs/Submission/";
 
-/// A property list in its XML form, written here as JSON.
+/// An XML property list, written here as JSON.
 inline std::string xmlOf(std::string_view json) {
   const auto value = parseJsonValue(json);
   EXPECT_TRUE(value) << value.error().message;
@@ -43,17 +43,17 @@ struct Outcome {
   }
 };
 
-/// `out` alone, with status 0.
+/// Only `out`, with status 0.
 inline Outcome prints(std::string out) {
   return {0, std::move(out), {}};
 }
 
-/// `error` alone, as the tool says it, with status 1 unless told otherwise.
+/// Only `error`, in the tool's form, with status 1 by default.
 inline Outcome fails(const std::string& error, int status = 1) {
   return {status, {}, "tavrelctl: " + error + "\n"};
 }
 
-/// The words of a command, also written as one text where none of them is empty or has spaces.
+/// The words of a command; may be given as one text if no word is empty or contains spaces.
 struct CommandLine : std::vector<std::string> {
   CommandLine(std::initializer_list<std::string> words) : vector(words) {}
   CommandLine(std::vector<std::string> words) : vector(std::move(words)) {}
@@ -75,7 +75,7 @@ class TemporaryDevice : public TemporaryRoot {
  public:
   std::string path(std::string_view devicePath) const { return root.path(devicePath); }
 
-  /// Every file below the root with its content, so that "nothing has changed" can be seen.
+  /// Every file below the root with its content, to check that nothing has changed.
   std::vector<std::pair<std::string, std::string>> files() const {
     std::vector<std::pair<std::string, std::string>> list;
     for (const auto& entry : std::filesystem::recursive_directory_iterator(path(""))) {
@@ -115,7 +115,7 @@ class TemporaryDevice : public TemporaryRoot {
     return json;
   }
 
-  /// Files a log, with metadata, in a folder of submissions ("pending/NAME").
+  /// Files a log with metadata in a submission folder ("pending/NAME").
   void fileLog(const std::string& name, std::string_view content,
                const std::string& metadata) const {
     write(kSubmission + name + ".log", content);

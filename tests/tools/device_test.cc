@@ -1,4 +1,4 @@
-// What acts on the daemon: requests, notifications, tasking.
+// Commands that act on the daemon: requests, notifications, tasking.
 #include "device.h"
 
 #include <chrono>

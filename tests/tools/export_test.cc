@@ -37,7 +37,7 @@ TEST(MetricPageTest, WritesFamiliesAsBothFormatsHaveThem) {
   MetricPage page;
   page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "2"}}, 0.5);
   page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "1\"\\"}}, std::int64_t{9007199254740993});
-  page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "2"}}, 7.0);  // the labels are taken
+  page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "2"}}, 7.0);  // the labels are already used
   page.summary({"c", "", "Summary."}, {}, {3, 1.5, {{0.5, 1}, {1, -0.0}}});
   page.histogram({"a", "", "Histogram."}, {{"k", "x"}},
                  {{{1, 2}, {2.5, 3}, {std::numeric_limits<double>::infinity(), 4}}, 9.0});

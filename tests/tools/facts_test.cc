@@ -1,4 +1,4 @@
-// Text and JSON of a command have the same facts: each figure of the text is in the JSON.
+// A command's text and JSON state the same facts: each figure of the text is in the JSON.
 #include <cmath>
 #include <map>
 #include <regex>
@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-// Units in the text, with how many of the JSON's units make one of them.
+// Units in the text, and how many units of the JSON make one of them.
 const std::map<std::string, double> kUnits = {{"", 1},         {"%", 0.01},     {"KiB", 0x1p10},
                                               {"MiB", 0x1p20}, {"GiB", 0x1p30}, {"TiB", 0x1p40},
                                               {"PiB", 0x1p50}, {"EiB", 0x1p60}, {"ns", 1e-9},
@@ -18,7 +18,7 @@ const std::map<std::string, double> kUnits = {{"", 1},         {"%", 0.01},     
 struct Figure {
   std::string digits;
   double value = 0;
-  double tolerance = 0;  // what rounding may have taken away; none of whole numbers
+  double tolerance = 0;  // what rounding may have removed; 0 for whole numbers
 
   bool isOneOf(const std::set<std::string>& texts, const std::vector<double>& values) const {
     if (texts.contains(digits)) return true;
@@ -45,7 +45,7 @@ std::vector<Figure> figuresOf(const std::string& text) {
   return figures;
 }
 
-// The figures of a document: its numbers, those in its texts, and the sizes of its lists.
+// The figures of a document: its numbers, the numbers in its texts, and the sizes of its lists.
 void collect(const nlohmann::json& json, std::set<std::string>& texts,
              std::vector<double>& values) {
   if (json.is_number()) {
@@ -63,12 +63,12 @@ void collect(const nlohmann::json& json, std::set<std::string>& texts,
   }
 }
 
-// Data is hexadecimal here and base64 in JSON; an instant's zone is Z there.
+// Removes data, which is base64 in JSON, and zones of instants, which are Z there.
 std::string withoutOtherForms(const std::string& text) {
   return std::regex_replace(text, std::regex("<[0-9a-f]*>| \\+0000"), "");
 }
 
-// Figures of the text that JSON lacks.
+// Figures of the text that the JSON lacks.
 std::string missingFigures(const std::string& text, const std::string& document) {
   const auto json = nlohmann::json::parse(document, nullptr, false);
   if (json.is_discarded()) return "no JSON";
@@ -96,7 +96,7 @@ std::vector<std::string> namesOfCommands(const TemporaryDevice& device, const st
   return names;
 }
 
-// "log list", "status": what takes --json.
+// Commands that accept --json: "log list", "status".
 std::set<std::string> commandsWithJson(const TemporaryDevice& device) {
   std::set<std::string> found;
   for (const std::string& group : namesOfCommands(device, "")) {
@@ -169,7 +169,7 @@ TEST(Facts, EveryFigureOfTextIsInJson) {
       "|registry list|registry show 4294967809|report list|report list --flat|report sample|"
       "report sample --delta --interval 0|disks|disks --all|catalogue");
   // Commands whose two outputs cannot be compared: each run differs (disk space, identifiers), a
-  // run changes what the next one prints, or the text is a document of its own.
+  // run changes what the next one prints, or the text is a separate document.
   std::set<std::string> covered{"allow",       "deny",        "erase",    "log preview",
                                 "notify post", "notify wait", "rehearse", "stat fold",
                                 "stat import", "tidy"};

@@ -61,7 +61,7 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
       << failed;
 }
 
-// However few files may be open, all is shown, or a line says what could not be read.
+// However few files may be open, everything is shown, or a line says what could not be read.
 TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
   const TemporaryDevice device;
   device.run("stat import", "scalar\t2\tapp.old\t1\n");
@@ -74,7 +74,7 @@ TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
   });
   const auto whole = device.run("stat list");
   const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
-  // UBSan opens a pipe when it first sees an exception of a type.
+  // UBSan opens a pipe when it first sees an exception of some type.
   device.write("/other" + store, "no database");
   EXPECT_EQ(TemporaryDevice::runAt(device.path("/other"), "stat list").status, 1);
   const std::string tooMany = "Too many open files";
@@ -84,7 +84,7 @@ TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
   const auto inFolder = [&](const char* failed) {
     return fails(format("cannot %s %s: ", failed, folder.string()) + tooMany + advice);
   };
-  // The child has three files open; the store takes three more while it is read.
+  // The child has three files open; reading the store takes three more.
   const std::optional<Outcome> kWithMore[] = {inFolder("open"), {},    {},   {},
                                               inFolder("list"), whole, whole};
   EXPECT_EQ(inChild([&] {

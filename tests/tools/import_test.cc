@@ -237,7 +237,7 @@ TEST(StatShow, FindsPercentilesAndBucketsOfAnyNumbers) {
   }
 }
 
-// The keys and numbers of the statistics, all of one day.
+// The keys and numbers of the statistics, which are all from one day.
 std::string exported(const TemporaryDevice& device, const std::string& options = {}) {
   std::istringstream lines(device.run("stat export " + options).out);
   std::string all, first;
@@ -282,7 +282,7 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   EXPECT_EQ(exported(device, "--day today"), "k=9223372036854775802 d=-1.5 d=0.5 d=-inf ");
 }
 
-// Takes two seconds between readings, and changes the machine in the meantime.
+// Waits two seconds between readings, and changes the machine in between.
 struct SlowPace final : CollectPace {
   explicit SlowPace(std::function<void()> between) : change(std::move(between)) {}
   Ticks now() override { return time; }
@@ -296,7 +296,7 @@ struct SlowPace final : CollectPace {
   Ticks time;
 };
 
-// Waits as long as asked, and ends a run after some readings.
+// Waits as long as requested, and ends a run after some readings.
 struct PeriodicPace final : CollectPace {
   Ticks now() override { return time; }
   bool endsBefore(Ticks end) override {
@@ -315,7 +315,7 @@ TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
   device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
   const std::filesystem::path state = device.path("/run/tavrel/collect.state");
   PeriodicPace pace;
-  int received = 0;  // KiB, 30 more before each reading
+  int received = 0;  // KiB; 30 more before each reading
   pace.between = [&] {
     device.write("/proc/net/dev",
                  "\n\neth0: " + std::to_string(1024 * (received += 30)) + " 0 0 0 0 0 0 0 0 0\n");
@@ -331,7 +331,7 @@ TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
   }
   EXPECT_EQ(out.str() + error.str(), "");
   const std::string all = exported(device);
-  // The second run counts what came between the last reading of the first and its own.
+  // The second run counts what happened between the last reading of the first run and its own.
   for (const char* values : {"usage.network.received_kib=120 ", "usage.samples=4 ",
                              "received_kib_per_second=0.5 ", "received_kib_per_second=1 "})
     EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
@@ -366,7 +366,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
   device.write("/sys/class/thermal/thermal_zone1/temp", "30000\n");
   SlowPace pace([&] {
-    // 100 ticks of which 30 idle and 10 waiting; 3 and 5 KiB on the network, 7 and 9 on the disk.
+    // 100 ticks, 30 of them idle and 10 waiting; 3 and 5 KiB on the network, 7 and 9 on the disk.
     device.write("/proc/stat", "cpu  30 40 50 430 60 6 7 8 0 0\ncpu0 1\ncpu1 9\nintr 1\n");
     device.write("/proc/net/dev",
                  "titles\ntitles\n    lo: 99 0 0 0 0 0 0 0 99 0\n"
@@ -386,7 +386,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
             "com.norvane.usage.processes\n");
 
   std::string all = exported(device);
-  // What the machine itself answers.
+  // Removes figures of the machine itself.
   all = std::regex_replace(all, std::regex("(disk.(total|free)_mib|processes)=\\S+ "), "");
   all = std::regex_replace(all, std::regex("com.norvane.usage."), "");
   EXPECT_EQ(all,

@@ -1,4 +1,4 @@
-// The kernel's figures as channels: trees of files in, reports out.
+// The kernel's figures as channels: from trees of files to reports.
 
 #include <array>
 #include <ctime>
@@ -18,7 +18,7 @@ const std::string kCpu = "/sys/devices/system/cpu/";
 const std::string kZone = "/sys/class/thermal/";
 const std::string kHwmon = "/sys/class/hwmon/";
 
-// The catalogue has the channel, in its unit, and also as a statistic if the daily run stores it.
+// The catalogue has the channel with its unit, and also as a statistic if the daily run stores it.
 void expectInCatalogue(const nlohmann::json& channel) {
   static const std::map<std::string, std::string_view> units = {
       {"s", "seconds"},        {"ms", "milliseconds"},
@@ -49,8 +49,8 @@ struct LiveDevice : TemporaryDevice {
     for (const File& file : files)
       write(file.path, file.content);
   }
-  /// "NAME=VALUE ..." of the channels, an array's values with commas, a state's as
-  /// "NAME:ENTRIES/RESIDENCY", with a '*' when it is the current one.
+  /// "NAME=VALUE ..." for the channels; an array's values separated by commas, a state's as
+  /// "NAME:ENTRIES/RESIDENCY", with a '*' for the current state.
   std::string values(const std::string& options = {}) const {
     std::string text;
     const auto outcome = run("report sample --json " + options);
@@ -91,7 +91,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
            " memory.oom_kills=1 "},
       {{{"/proc/meminfo", "MemTotal:       100 kB\nDirty:     x kB\nSlab: 7 kB\n"}},
        "memory.total=100 memory.slab=7 "},
-      // 2 has the columns of older kernels; partitions are no devices.
+      // The second disk has the columns of older kernels; partitions are not devices.
       {{{"/proc/diskstats",
          " 8 0 sda 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16 17\n 8 1 sda1 1 2 3 4 5 6 7 8 9 10 11\n"
          " 8 16 c/d0 1 2 3 4 5 6 7 8 9 10 11\n"},
@@ -116,7 +116,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "zram0.zram_data=1 zram0.zram_compressed=2 zram0.zram_used=3 zram0.zram_limit=4 "
        "zram0.zram_used_max=5 zram0.zram_same_pages=6 zram0.zram_backed=7 "
        "zram0.zram_backing_reads=8 zram0.zram_backing_writes=9 "},
-      // Processor 1 does not run; numbers of interrupts are of no account, handlers are.
+      // Processor 1 is offline; handlers of interrupts matter, their numbers do not.
       {{{"/proc/interrupts",
          "       CPU0 CPU2\n 3: 1 2 GIC 9 Level a, b c\n 4: 10 20 GIC 8 Edge b c\n"
          " 5: 5 6 GIC 7 Edge b c\nNMI: 7 8 Non-maskable\nERR: 4\n"}},
@@ -151,7 +151,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
          "Total transition : 5\n"},
         {"/sys/class/devfreq/gpu/cur_freq", "200000000"}},
        "gpu.frequency=200MHz:2/12* 400MHz:3/34  "},
-      // Without the table of transitions the entries are not known; they are not 0.
+      // Without the table of transitions, the entries are unknown, not 0.
       {{{kZone + "cooling_device0/type", "fan\n"},
         {kZone + "cooling_device0/stats/time_in_state_ms", "state0\t5\nstate1\t6\n"},
         {kZone + "cooling_device1/type", "cpu\n"},
@@ -206,7 +206,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
   };
   for (const Row& row : rows) {
     const LiveDevice device(row.files);
-    // By groups of one unit; here the order of channels is that of the report.
+    // Grouped by unit; here the channels are in the order of the report.
     EXPECT_EQ(device.values(), row.values) << row.files[0].path;
   }
 }
@@ -248,7 +248,7 @@ TEST(LiveTest, ARootShowsOnlyItsOwnFolders) {
   const TemporaryDevice bare;
   bare.write("/sys/devices/system/edac/mc/mc0/ce_count", "1\n");
   bare.check("report list", prints("no channels\n"));
-  // A link makes the machine's own folder the root's.
+  // With the link, the root uses the machine's own folder.
   std::filesystem::create_symlink("/proc", bare.path("/proc"));
   EXPECT_EQ(bare.run("report sample --group Boot --live").status, 0);
 }
@@ -262,7 +262,7 @@ TEST(LiveTest, DrivesAsleepAreNotRead) {
   EXPECT_EQ(device.values(), "drivetemp.temp1=30000 sensors.hottest=30000 ");
 }
 
-// What is recorded plays back the same, in place of the live services.
+// A recording plays back the same values, in place of the live services.
 TEST(LiveTest, RecordsWhatIsLive) {
   const LiveDevice device({{"/proc/uptime", "7.00 1.00\n"},
                            {"/proc/softirqs", "     CPU0 CPU1\n HI: 1 2\n"},
@@ -277,7 +277,7 @@ TEST(LiveTest, RecordsWhatIsLive) {
   other.check("report list --live", prints("no channels\n"));
   EXPECT_EQ(other.run("report list --recorded").out, device.run("report list --live").out);
 
-  // Ids do not depend on the machine or the boot.
+  // Ids depend neither on the machine nor on the boot.
   other.write("/proc/uptime", "8.00 1.00\n");
   EXPECT_EQ(other.run("report sample").out, live.out);
   EXPECT_EQ(device.run("registry list").out, other.run("registry list").out);
@@ -328,7 +328,7 @@ TEST(LiveTest, TheDailyRunStoresTheHealthOfDrives) {
   }
   EXPECT_EQ(stored, (std::vector<std::string>{"nvme0.critical_warning=16", "nvme0.spare_pct=97",
                                               "nvme0.written_growth=2048000"}));
-  // A mask is not coarsened, all else of a drive to one figure.
+  // A mask is not coarsened; everything else about a drive is, to one figure.
   const auto rules = device.json(
       "whitelist explain com.norvane.ioreport.nvme0.written_growth "
       "com.norvane.ioreport.nvme0.critical_warning --value 2048000");
@@ -344,7 +344,7 @@ TEST(LiveTest, TheCatalogueHasTheChannelsOfThisMachine) {
     expectInCatalogue(channel);
 }
 
-// Every daily figure of this machine is in the example, which has nothing to complain about.
+// The example includes every daily figure of this machine, and passes the whitelist check.
 TEST(LiveTest, TheExampleListsTheDailyFigures) {
   const std::string file = TAVREL_EXAMPLES "/whitelist-live.plist";
   EXPECT_EQ(TemporaryDevice::runAt("/", "whitelist check " + file).status, 0);

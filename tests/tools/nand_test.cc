@@ -6,7 +6,7 @@ namespace {
 
 using namespace std::string_literals;
 
-// Little-endian words of 32 bits.
+// Little-endian 32-bit words.
 std::string words(std::initializer_list<std::uint32_t> list) {
   std::string bytes;
   for (const std::uint32_t word : list) {
@@ -86,7 +86,7 @@ ReadsBeforeErasure
   EXPECT_EQ(json["com.norvane.NANDInfo.NumLogicalReads"], -1);
   EXPECT_EQ(json["com.norvane.NANDInfo.BandsMaxTempHisto2"], 0);
 
-  // An old buffer has the first figures only, and nothing to compute from.
+  // An old buffer has only the first figures, and nothing to compute others from.
   record(device, built(device, R"([["exportVersion", 131073]])"));
   const Outcome old = device.run("nand info");
   EXPECT_EQ(old.status, 0) << old;
@@ -263,7 +263,7 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
                   "cut one out with dd bs=4096 count=1 skip=CHANNEL"));
 }
 
-// A descriptor of version 6 with one field of kind 0.
+// A version 6 descriptor with one field of kind 0.
 std::string descriptor(std::uint32_t count, const std::string& fieldFormat) {
   std::string bytes =
       words({0, 6, 4, count, 0, 0, 36, 0}) + "%s\n\0"s + words({1, 0, 0, 0, 0}) + fieldFormat;
@@ -281,7 +281,7 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   EXPECT_EQ(std::count(fixed.out.begin(), fixed.out.end(), '='), 26 * 3000);
   EXPECT_TRUE(fixed.out.ends_with("\n\n"));
 
-  // A text far longer than its records.
+  // A text that is far longer than its records.
   device.write("/wide", descriptor(3, "%4096u|"));
   const CommandLine command = "nand snapshot - --descriptor " + device.path("/wide");
   const std::string wide(4095, ' ');

@@ -22,7 +22,7 @@ struct PageTest : testing::Test {
     ASSERT_EQ(device.run("stat import -", lines).status, 0);
   }
 
-  /// The page without its style sheet, and with a blank for each tag.
+  /// The page without its style sheet, and with each tag replaced by a blank.
   std::string textOf(const std::string& options = {}, int status = 0) const {
     const Outcome outcome = device.run("page -o - " + options);
     EXPECT_EQ(outcome.status, status) << outcome.error;
@@ -60,7 +60,7 @@ TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
 }
 
 TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
-  // How long ago statistics are of, and the day that is then shown.
+  // How many days ago statistics were recorded, and how many days ago the shown day is.
   const std::pair<int, int> kDays[] = {{100, 100}, {0, 0}, {3, 3}, {1, 1}};
   for (const auto& [recorded, shown] : kDays) {
     import("scalar\t" + std::to_string(today() - recorded) + "\tk\t1\n");

@@ -91,11 +91,11 @@ TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
   EXPECT_EQ(read("a\n" + large + "b\nc", true), std::vector<std::string>());
   EXPECT_FALSE(reader.wholeness());
   EXPECT_EQ(read("new\ntorn", false), (std::vector<std::string>{"1new"}));
-  EXPECT_EQ(read("new\n", false), std::vector<std::string>());  // the writer has cut the end off
+  EXPECT_EQ(read("new\n", false), std::vector<std::string>());  // the writer has truncated the end
   EXPECT_EQ(read("new\nlonger\n", false), (std::vector<std::string>{"2longer"}));
 }
 
-// Calls a hook whenever what was printed is flushed.
+// Calls a hook whenever output is flushed.
 struct HookedBuffer final : std::stringbuf {
   int sync() override {
     hook(str());
@@ -113,7 +113,7 @@ TEST(Records, FollowsWhatIsFiledUntilASignalComes) {
     const std::string second = json ? kTelemetryLine : "s=[7,8]";
     int stage = 0;
     buffer.hook = [&](const std::string& printed) {
-      if (stage == 0) {  // without a folder so far
+      if (stage == 0) {  // there has been no folder so far
         device.write(kRecords + "172-2026-11-27.jsonl", kEccLine + part);
         stage = 1;
       } else if (stage == 1 && printed.find(first) != std::string::npos) {
@@ -187,7 +187,7 @@ Next log        the next run may write one; the last was written 2026-01-01 00:0
       "last_logged": "2200-01-01T00:00:00Z", "last_is_in_future": true, "allowed_now": false,
       "allowed_from": "2200-01-08T00:00:00Z"})"_json);
   EXPECT_EQ(document["log"]["validity"], R"({"ValidityList[0]": [12, -1]})"_json);
-  // Without its metadata a log is known by its name.
+  // A log without metadata is recognised by its name.
   const std::string named = outbox + "StorageStatus-9.log";
   for (const char* part : {"6T17", "6T18", "7T18"})
     std::filesystem::remove(outbox + part + ".log");
@@ -206,7 +206,7 @@ Next log        the next run may write one; the last was written 2026-01-01 00:0
   std::filesystem::permissions(preferences, std::filesystem::perms::none);
   const auto run = [&device, user = geteuid()](const char* command) {
     if (user == 0) {
-      EXPECT_EQ(seteuid(65534), 0);  // who may read anything sees no refusal
+      EXPECT_EQ(seteuid(65534), 0);  // a user who may read everything gets no refusal
     }
     const Outcome outcome = device.run(command);
     EXPECT_EQ(seteuid(user), 0);

@@ -1,4 +1,4 @@
-// tavrelctl rehearse, over a device that has something for every step.
+// tavrelctl rehearse, on a device that has something for every step.
 #include <regex>
 #include <set>
 
@@ -45,7 +45,7 @@ struct Rehearsed : TemporaryDevice {
     today = json("status")["today"];
   }
 
-  /// The text of a rehearsal, with what differs from one machine and day to another masked.
+  /// The text of a rehearsal, masking whatever differs between machines and days.
   std::string text(const std::string& options) const {
     const Outcome outcome = run("rehearse" + options);
     EXPECT_EQ(outcome.status, 0) << outcome;
@@ -68,7 +68,7 @@ struct Rehearsed : TemporaryDevice {
   nlohmann::json today;
 };
 
-// Without events that only differ from an earlier one in names and values.
+// Removes events that differ from an earlier one only in names and values.
 std::string firstOfEachKind(const std::string& text) {
   std::set<std::string> kinds;
   std::string kept;

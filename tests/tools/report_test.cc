@@ -1,4 +1,4 @@
-// The example recording, looked at with the registry and report commands.
+// The example recording, inspected with the registry and report commands.
 #include "device.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/coding.h"
@@ -106,7 +106,7 @@ TEST_F(ReportTest, SamplesAndSubtracts) {
   device.check(
       "report sample --group Temperature --delta --count 2 --interval 0",
       prints("Change 1 of 2\n" + path + "0.25 °C\n\nChange 2 of 2\n" + path + "-0.125 °C\n"));
-  // Whatever is printed piece by piece looks as if it had been printed at once.
+  // Output that is printed piece by piece looks as if it had been printed at once.
   for (const auto& [command, indent] : {std::pair("list", 2),
                                         {"list --group none", 2},
                                         {"sample", 2},
@@ -137,7 +137,7 @@ plist::Data element(std::initializer_list<std::uint64_t> words) {
 }
 
 TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
-  // The counters of a state run backwards, over the end of 64 bits.
+  // A state's counters run backwards, past the 64-bit limit.
   Array groups = Array::create();
   for (const std::uint64_t count : {std::uint64_t{5}, ~std::uint64_t{0}})
     groups.append(element({7, 8, 0x100000002, 0, 1, count, count}));

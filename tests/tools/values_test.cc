@@ -106,7 +106,7 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
             "  ü                1\n"
             "  a\\x1b[31m\\n\\…   10\n"
             "  a long key i…  100\n");
-  // In a pipe nothing is cut, and a long cell pushes only its own row.
+  // In a pipe, nothing is cut, and a long cell pushes only its own row to the right.
   const std::string longKey(100, 'k');
   table.add({longKey, "1"});
   EXPECT_EQ(printed(table).substr(0, 55), "  KEY" + std::string(49, ' ') + "N");

@@ -6,7 +6,7 @@
 namespace tavrel {
 namespace {
 
-// Groups of a file of ours stand in the order of their names, so the later name wins.
+// Groups in our own files are sorted by name, so the later name wins.
 constexpr std::string_view kGood = R"({
   "Apps": {"ScalarKeys": {"app.starts": {"sig_fig": 2, "bucket_interval": 10}, "app.raw": {}},
            "DistributionKeys": {"app.load": {"intervals": [10, 20.5]}}},
@@ -177,7 +177,7 @@ gets coarser (3)
   EXPECT_EQ(json["finer"].size(), 4U);
   EXPECT_EQ(json["newly_leaves"].size(), 0U);
 
-  // What only stops leaving or gets coarser needs no second look.
+  // Changes after which less leaves, or coarser values, need no second look.
   device.write("/none.plist", xmlOf("{}"));
   EXPECT_EQ(device.run({"whitelist", "diff", before, device.path("/none.plist")}).status, 0);
   const std::string absent = device.path("/absent");

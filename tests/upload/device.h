@@ -1,4 +1,4 @@
-// A device whose logs are sent, beside the servers that they are sent to.
+// A device whose logs are sent, and the servers that receive them.
 #pragma once
 
 #include <sys/file.h>
@@ -27,7 +27,7 @@ inline std::string nameOf(int number) {
 struct Device : DeviceServices {
   Device() {
     permit("<true/>");
-    // Uploads go past all of them: nobody listens there.
+    // Uploads ignore all of these: nobody listens there.
     for (const char* variable : {"http_proxy", "https_proxy", "all_proxy"})
       setenv(variable, "http://127.0.0.1:1", 1);
     for (const char* variable : {"no_proxy", "NO_PROXY"})
@@ -57,7 +57,7 @@ struct Device : DeviceServices {
   Lines names(const std::string& place = "outbox") {
     return *files.list(root.path(kSubmission + place));
   }
-  /// What a run of another process holds. One has been there before.
+  /// Takes the lock of a run, as another process would. A run must have taken place before.
   Descriptor lockRuns() const {
     Descriptor lock(open(root.path("/var/lib/tavrel/upload/lock").c_str(), O_RDWR | O_CLOEXEC));
     EXPECT_EQ(flock(lock.get(), LOCK_EX | LOCK_NB), 0);

@@ -1,5 +1,5 @@
-// Servers for an uploader: Debian's nginx with the configuration that is documented, and one that
-// answers as it is told.
+// Servers for an uploader: Debian's nginx with the documented
+// configuration, and a scripted one.
 #pragma once
 
 #include <arpa/inet.h>
@@ -13,7 +13,7 @@
 
 namespace tavrel {
 
-/// A socket that listens at a free port of 127.0.0.1.
+/// A socket that listens on a free port of 127.0.0.1.
 inline Descriptor listenAtFreePort(int& port) {
   Descriptor listener(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
   sockaddr_in address{AF_INET, 0, {htonl(INADDR_LOOPBACK)}, {}};
@@ -49,7 +49,7 @@ class Nginx {
       execlp("sh", "sh", "-c", kStart, folder.c_str(), nullptr);
       _exit(127);
     }
-    // It listens before it writes this file.
+    // nginx listens before it writes this file.
     while (!std::filesystem::exists(folder + "nginx.pid")) {
       if (waitpid(process, nullptr, WNOHANG) != 0)
         throw std::runtime_error("nginx has ended: " + contentOf(folder + "error.log"));
@@ -57,7 +57,7 @@ class Nginx {
     }
   }
   ~Nginx() { end(); }
-  /// Once it has ended, which completes its log.
+  /// Ends the server, which completes its log, and returns the log.
   std::string accessLog() {
     end();
     return contentOf(folder + "tavrel-upload.log");
@@ -68,8 +68,8 @@ class Nginx {
   int port = 0;
 
  private:
-  // Certificates of two authorities, the server for 127.0.0.1, a device, and one that the device's
-  // key signed; then nginx.
+  // Certificates of two authorities, of the server 127.0.0.1, of a device, and one signed with the
+  // device's key; then nginx.
   static constexpr const char* kStart = R"(cd "$0" && mkdir srv
     make() {
       N=$1; shift
@@ -91,8 +91,8 @@ class Nginx {
   pid_t process = 0;
 };
 
-/// Takes each request whole and answers with the text that the reply gives, in which "DIGEST"
-/// stands for the request's own. An empty one closes the connection.
+/// Receives each request completely and answers with the text from `reply`, in which "DIGEST"
+/// stands for the digest of the request. An empty text closes the connection.
 class ScriptedServer {
  public:
   using Reply = std::function<std::string(const std::string& request)>;
@@ -103,7 +103,7 @@ class ScriptedServer {
   }
   std::string url() const { return "http://127.0.0.1:" + std::to_string(port_) + "/logs"; }
 
-  /// Waits until the thread waits itself, holding no lock that a forked process would need.
+  /// Waits until the thread itself waits, holding no lock that a forked process would need.
   void settle() const {
     while (!isIdle_)
       sched_yield();

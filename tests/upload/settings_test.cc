@@ -5,7 +5,7 @@
 #include "upload/connection.h"
 #include "upload/network.h"
 
-// Stands in for the C library's: the look-up of one name never ends.
+// Replaces the C library's function: the look-up of one name never ends.
 extern "C" int getaddrinfo(const char* node, const char* service, const addrinfo* hints,
                            addrinfo** result) {
   if (node != nullptr && std::string_view(node) == "hangs.example") pause();
@@ -49,7 +49,7 @@ TEST(Upload, HasADeadlineForEverything) {
   device.configuration.url = "http://hangs.example/logs";
   device.configuration.connect = seconds(1);
   silent.settle();
-  // In a process of its own: the look-up never ends.
+  // In a separate process, because the look-up never ends.
   EXPECT_EQ(inChild([&] {
               alarm(60);
               return device.run(true) == Outcome::Waits &&

@@ -54,7 +54,7 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
   device.use(server, nginx.folder, "ca", "device");
   EXPECT_EQ(device.run(true), Outcome::Done);
   EXPECT_EQ(device.log.lines.back(), "logs sent: 5, refused by the server: 0");
-  device.add(nameOf(7));  // as when the answer was lost
+  device.add(nameOf(7));  // as if the answer had been lost
   EXPECT_EQ(device.run(), Outcome::Done);
   EXPECT_EQ(device.names(), Lines{});
   std::string expected;
@@ -83,7 +83,7 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
   const std::string received = "Tavrel-Received: DIGEST\r\n";
   const std::string busy = "503 Busy\r\nRetry-After: ";
   const std::string ends = "the server answers ";
-  // The answer, what is said of it, and the shortest and the longest pause.
+  // The answer, the message about it, and the shortest and longest pause.
   const std::tuple<std::string, std::string, double, double> cases[] = {
       {"200 OK\r\nContent-Length: 5\r\n\r\nhello", ends + "200" + portal, 300, 600},
       {"201 Created\r\nTavrel-Received: sha-256=:bw==:\r\n", ends + "201" + portal, 300, 600},
@@ -120,7 +120,7 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
     EXPECT_EQ(state.failure, "cannot send log " + nameOf(1) + ": " + why);
     EXPECT_EQ(state.failedAttempts, 1);
     const double wait = state.nextAttempt.value_or(device.clock.time) - device.clock.time;
-    EXPECT_GE(wait, shortest - 1);  // the state has whole seconds
+    EXPECT_GE(wait, shortest - 1);  // the state has only whole seconds
     EXPECT_LE(wait, longest);
     const int connections = server.connections;
     EXPECT_EQ(device.run(), Outcome::Waits);
@@ -139,7 +139,7 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
   EXPECT_EQ(device.names(), Lines{nameOf(1) + ".log"});
 }
 
-// libcurl 7.88 takes the line for part of a header that it has freed, when a handle is used again.
+// When a handle is reused, libcurl 7.88 takes the line as part of a header that it has freed.
 TEST(Upload, AFoldedLineBelongsToNoEarlierAnswer) {
   Device device;
   device.add(nameOf(1));
@@ -170,7 +170,7 @@ TEST(Upload, GivesUpWhatTheServerRefusesAndKeepsTheNewest) {
   EXPECT_TRUE(device.log.says("the server refuses log " + nameOf(4) + " (413): it is kept in "));
   EXPECT_EQ(device.state().sent, 1);
   EXPECT_EQ(device.state().refused, 20);
-  // 4 MiB hold few beside the large one; metadata stays with each.
+  // Only a few fit in 4 MiB besides the large one; metadata stays with each.
   EXPECT_EQ(device.names("refused").size(), 1 + 2 * 10);
   device.add(nameOf(40));
   fs::remove(device.root.path(kSubmission + "refused/" + nameOf(30) + ".log"));
@@ -179,7 +179,7 @@ TEST(Upload, GivesUpWhatTheServerRefusesAndKeepsTheNewest) {
   EXPECT_EQ(device.run(), Outcome::Done);
   EXPECT_EQ(device.names("refused").size(), 2 * 16U);
   EXPECT_EQ(device.names("refused")[0], nameOf(44) + ".log");
-  // A log that is held does not make the run go on.
+  // A log that is held back does not keep the run going.
   device.permit("<true/>", "<integer>20784</integer>");
   device.add(nameOf(60));
   device.add(nameOf(61));
@@ -219,7 +219,7 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
     device.add(nameOf(1));
     ScriptedServer server([&, value = value, firstDay = firstDay](const std::string&) {
       device.permit(value, firstDay);
-      return "HTTP/1.1 100 Continue\r\n\r\n";  // and no more
+      return "HTTP/1.1 100 Continue\r\n\r\n";  // nothing more
     });
     const auto begin = std::chrono::steady_clock::now();
     EXPECT_EQ(device.runAgainst(server), Outcome::Done);
@@ -235,7 +235,7 @@ TEST(Upload, JudgesEachLogByItsDay) {
   const std::string none =
       "no log is sent: DiagnosticSubmissionFirstDay of com.norvane.zentrix is no day: set it to an "
       "integer, days since 1970-01-01";
-  // The first day, what is sent, and the last line.
+  // The first day, the logs that are sent, and the last line.
   const std::tuple<const char*, std::set<std::string>, std::string> cases[] = {
       {"<integer>20783</integer>", {nameOf(1), kNand}, "logs sent: 2, refused by the server: 0"},
       {"<integer>20784</integer>",
@@ -250,7 +250,7 @@ TEST(Upload, JudgesEachLogByItsDay) {
     SCOPED_TRACE(firstDay);
     Device device;
     device.permit("<true/>", firstDay);
-    device.add(kNand);  // has no day of its own
+    device.add(kNand);  // does not belong to a day
     device.add(nameOf(1));
     device.write(kOutbox + nameOf(1) + ".log", kOfTheDayBefore);
     std::set<std::string> sent;
@@ -266,7 +266,7 @@ TEST(Upload, JudgesEachLogByItsDay) {
   }
 }
 
-// Calls `reach` before one file is opened. The file cannot be removed.
+// Calls `reach` before one file is opened. That file cannot be removed.
 struct WatchedFiles final : FileSystem {
   int openFile(const char* path, int flags, mode_t mode) override {
     if (path == watched) reach();

@@ -45,7 +45,7 @@ TEST_F(Recording, InstalledFilesBuildTheExamples) {
 TEST_F(Recording, ProgramsOfAnotherCLibraryRecord) {
   if (std::system("command -v musl-gcc >/dev/null") != 0) GTEST_SKIP() << "no musl-gcc";
   const std::string to = root / "musl";
-  // It comes without the kernel's headers.
+  // musl does not include the kernel's headers.
   outputOf("mkdir " + to + " && ln -s /usr/include/linux /usr/include/asm-generic " + to +
            " && ln -s /usr/include/$(cc -print-multiarch)/asm " + to);
   outputOf(

@@ -1,4 +1,4 @@
-// The other ways to record: the tool, Python and StatsD.
+// Other ways to record: the tool, Python and StatsD.
 #include "tests/client/recording.h"
 
 namespace tavrel {
@@ -6,7 +6,7 @@ namespace {
 
 const std::string kTool = TAVREL_BUILD "/bin/tavrelctl ";
 
-/// Programs go by the machine's clock.
+/// Programs use the machine's clock.
 class Programs : public Recording {
  protected:
   Programs() { testClock().realtime = 0; }
@@ -51,7 +51,7 @@ TEST_F(Programs, TheToolSaysWhyItCannotRecord) {
            (root / "etc/tavrel/recorders.plist").string());
   EXPECT_EQ(outputOf(asNobody + "stat add com.norvane.n 2"), "");
   EXPECT_EQ(outputOf(asNobody + "stat add n 1", 1), refused("n"));
-  // Too small a limit of file sizes is one that the process has.
+  // A file size limit that is too small belongs to the process.
   EXPECT_EQ(outputOf("ulimit -f 8; " + kTool + "stat add n 1", 1),
             "tavrelctl: cannot record in " + folder.string() +
                 ": memory or a limit of this process is exhausted: run 'tavrelctl stat fold'\n");
@@ -85,14 +85,14 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=2");
   EXPECT_EQ(records["com.norvane.usage.cpu.busy_percent"], std::vector<double>{35});
 
-  // What is below one KiB is kept for the next run.
+  // A remainder below one KiB is kept for the next run.
   for (const int bytes : {1536, 3072}) {
     receive(bytes);
     EXPECT_EQ(outputOf(once), "");
   }
   EXPECT_NE(foldedScalars().find("network.received_kib=3 "), std::string::npos);
 
-  // No comparison with another start of the machine, nor with what is no reading.
+  // It is not compared with a reading from another boot, nor with a file that is not a reading.
   write("proc/stat", "cpu  20 0 0 110 0 0 0 0\ncpu0 1\n");
   write("proc/sys/kernel/random/boot_id", "boot-2\n");
   EXPECT_EQ(outputOf(once), "");
@@ -108,7 +108,7 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   }
   write("run/tavrel/collect.state", std::string(10'000, 'x'));
   EXPECT_TRUE(outputOf(once).starts_with("tavrelctl: this sample has no rates: "));
-  // Of the future.
+  // A reading from the future.
   write("run/tavrel/collect.state",
         "tavrel-collect 1\nboot boot-2\nat 9000000000000000000\ncpu 0 0\nend\n");
   EXPECT_EQ(outputOf(once), "");

@@ -56,7 +56,7 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
     for (int i = 1; i < 1500; ++i)
       many += ":7";
     recorder.take(many + "|ms|@0.001");
-    recorder.take("time:9|c");  // a scalar may have the name of a series
+    recorder.take("time:9|c");  // a scalar may have the same name as a series
     recorder.take("bad\nset:1|s\n" + std::string(1023, 'n') + ":1|c");
     recorder.count(StatsdFault::TooLong);
   });
@@ -72,7 +72,7 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
                          {{"s.tavrel-statsd.too_long", kToday}, 1}};
   EXPECT_EQ(scalars, expected);
   std::vector<double> times{3.5, 4, 4};
-  times.insert(times.end(), 1000, 5);  // the most of a line
+  times.insert(times.end(), 1000, 5);  // the maximum for one line
   times.insert(times.end(), 1000, 6);
   times.insert(times.end(), 1500, 7);
   EXPECT_EQ(records["s.time"], times);
@@ -110,7 +110,7 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   const std::uint16_t port = ntohs(address.sin_port);
   EXPECT_EQ(openLoopbackSocket(port).error().message,
             "cannot listen on UDP port " + std::to_string(port) + kInUse);
-  // They wait for the program, which starts because of them.
+  // The datagrams wait for the program, which starts because of them.
   const std::string longest = std::string(kLongestDatagram - 7, '\n') + "long:1|c";
   send(AF_UNIX, unixAddress(path), {"u:1|c", longest.substr(1), longest, std::string()});
   send(AF_INET, address, {"i:2|c", "i:3|c\n", "t:1.5|ms"});

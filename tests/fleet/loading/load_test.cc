@@ -50,7 +50,7 @@ class LoadTest : public ::testing::Test {
     return text;
   }
 
-  /// The rows that a statement yields, sorted, with '|' between columns.
+  /// The rows that a statement returns, sorted, with '|' between columns.
   std::multiset<std::string> rows(const char* statement) const {
     sqlite3* database = nullptr;
     EXPECT_EQ(sqlite3_open(at("fleet.db").c_str(), &database), SQLITE_OK);
@@ -116,7 +116,7 @@ TEST_F(LoadTest, TakesAnOutbox) {
   EXPECT_EQ(first.status, 0);
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
-  // The same logs under other names, and in another form.
+  // The same logs under other names, and in another encoding.
   write("again/a.log.gz", gzipped(sampleLog(1)));
   write("again/b.plist", sampleLog(2));
   EXPECT_EQ(run({at("again"), at("outbox"), "--json"}).out,
@@ -180,7 +180,7 @@ TEST_F(LoadTest, TakesArchives) {
   EXPECT_NE(cut.error.find("refused: cut.tar: the rest cannot be read: "), std::string::npos)
       << cut.error;
   EXPECT_EQ(cut.status, 1);
-  // A file of a gigabyte in an archive of some kilobytes.
+  // A file of one gigabyte in an archive of a few kilobytes.
   const std::string bomb =
       format("cd %s && truncate -s 1G big.log && tar -cSf bomb.tar big.log", at(""));
   ASSERT_EQ(std::system(bomb.c_str()), 0);

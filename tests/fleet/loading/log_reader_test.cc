@@ -67,9 +67,9 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
       binary,
       gzipped(kSampleLog),
       gzipped(binary),
-      // Two members of gzip's form are one document.
+      // Two gzip members form one document.
       gzipped(kSampleLog.substr(0, 700)) + gzipped(kSampleLog.substr(700)),
-      // Only a reader of all of XML takes these.
+      // Only a full XML reader accepts these.
       changed(kSampleLog, "<dict>", "<!-- a comment -->\r\n<dict>"),
       changed(kSampleLog, "com.example.starts", "com.example.st&#97;rts"),
       changed(kSampleLog, "<plist version", "<plist  version"),
@@ -80,7 +80,7 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
               "<key>BHScalars</key>\n\t<dict>\n",
               "<key>BHScalars</key>\n\t<dict>\n<key>com.example.starts</key>"
               "<integer>12000</integer>"),
-      // What is not read may be anything.
+      // Parts that are not read may be anything.
       changed(kSampleLog, "<array/>", "<array><dict><key>a</key><true/></dict></array>"),
   };
   LogReader reader;
@@ -224,8 +224,8 @@ TEST(LogReaderTest, TakesWhatValuesCanGive) {
       {"1", "250", "nan", "nan"},           // one was not a number
       {"1", "inf", "inf", "nan"},           // one was infinite
       {"-inf", "inf", "nan", "nan"},        // two were
-      {"-1e308", "1.7e308", "inf", "inf"},  // their difference is
-      {"1e200", "3e200", "2e200", "inf"},   // the square of it is
+      {"-1e308", "1.7e308", "inf", "inf"},  // their difference is infinite
+      {"1e200", "3e200", "2e200", "inf"},   // the square of their difference is
       {"nan", "nan", "nan", "nan"},         // the first was not a number
   };
   for (const auto& [minimum, maximum, mean, deviations] : numbers) {
@@ -242,7 +242,7 @@ TEST(LogReaderTest, RefusesWhatIsNoWholeDocument) {
   EXPECT_EQ(faultIn("bplist00"),
             plist::readBinary(asBytes(std::string_view("bplist00"))).error().message);
   EXPECT_EQ(faultIn(std::string("<\0?\0", 4)), "is in the encoding \"UTF-16\": only UTF-8 is read");
-  // At each length that it can be cut to.
+  // Cut to each possible length.
   for (std::size_t size = 1; size < kSampleLog.find("</plist>") + 8; ++size) {
     const std::string found = faultIn(kSampleLog.substr(0, size));
     EXPECT_EQ(found, "is cut short: the property list does not end within its " +

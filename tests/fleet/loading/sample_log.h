@@ -1,4 +1,4 @@
-// A small good log, and variations of its text.
+// A small valid log, and variations of its text.
 #pragma once
 
 #include <gtest/gtest.h>
@@ -91,14 +91,14 @@ inline const std::string kSampleLog = R"(<?xml version="1.0" encoding="UTF-8"?>
 </plist>
 )";
 
-/// `text` with its first `old` as `replacement`.
+/// `text` with the first `old` replaced.
 inline std::string changed(std::string text, std::string_view old, std::string_view replacement) {
   const std::size_t at = text.find(old);
   EXPECT_NE(at, std::string::npos) << old;
   return text.replace(at, old.size(), replacement);
 }
 
-/// The sample of another device, as its count of starts says.
+/// The sample from another device, identified by its count of starts.
 inline std::string sampleLog(int starts) {
   return changed(kSampleLog, "12000", std::to_string(starts));
 }
