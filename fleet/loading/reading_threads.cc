@@ -89,7 +89,7 @@ void ReadingThreads::readPieces() {
       changed_.wait(lock, [&] {
         if (stopped_ || (foundAll_ && waiting_.empty())) return true;
         if (waiting_.empty()) return false;
-        // `next` waits for the first piece, so that one is read whatever its size.
+        // `next` waits for the first piece, so that one is read even beyond the limit.
         return bytes_ < kBytesAhead || waiting_.front() == order_.front();
       });
       if (stopped_ || waiting_.empty()) return;

@@ -1,4 +1,4 @@
-// What is wrong with the page that is open, as a list of texts.
+// Returns the faults of the open page as a list of texts.
 (() => {
   const faults = [];
   const near = 2;

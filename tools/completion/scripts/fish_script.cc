@@ -62,7 +62,7 @@ std::string fishQuoted(std::string_view text) {
   return shellQuoted(doubled, kQuoteEscape);
 }
 
-// The values for `complete`: what follows the names of an option.
+// The options of fish's `complete` that describe a value; they follow the names of the option.
 std::string valueText(const CompletedProgram& program, const CommandModel& command,
                       const OptionModel& option) {
   const std::string only = option.names.empty() ? "" : " -x";
