@@ -22,8 +22,8 @@ inline constexpr int kJsonFormatVersion = 1;
 
 /// `object` with "format_version" as its first member.
 Json withFormatVersion(Json object);
-/// `value` as text, indented by `indent` spaces, or on one line for
-/// -1. Repairs malformed UTF-8.
+/// `value` as text, indented by `indent` spaces, or on a single line when `indent` is -1. Malformed
+/// UTF-8 is repaired.
 std::string jsonText(const Json& value, int indent);
 
 enum ExitStatus : int { kExitSuccess = 0, kExitFailure = 1, kExitUsage = 2 };

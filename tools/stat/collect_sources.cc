@@ -18,7 +18,7 @@ namespace {
 // Bytes of a file in /proc or /sys; with hundreds of CPUs, some have about 100 KiB.
 constexpr std::size_t kLargestFile = 1U << 20;
 
-// Rereads the file into `content`, which stays empty when that fails.
+// Rereads the file into `content`, which is empty when that fails.
 void readAgain(const Descriptor& file, std::string& content) {
   constexpr std::size_t kPart = 4096;
   std::size_t size = 0;
