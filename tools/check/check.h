@@ -40,8 +40,8 @@ struct Check {
   std::vector<CheckFigure> figures = {};
 };
 
-/// When something that should happen each day is this old, in seconds, it has stopped happening.
-/// All checks of an age use these two thresholds.
+/// The ages, in seconds, at which the lack of something that should happen each day becomes a
+/// warning, and then critical. Every check of an age uses these two thresholds.
 inline constexpr std::int64_t kWarningAge = std::int64_t{2} * 86'400;
 inline constexpr std::int64_t kCriticalAge = std::int64_t{7} * 86'400;
 
