@@ -154,6 +154,7 @@ device; free some space
 health: exit-code 1
   cannot keep counters: cannot write /var/lib/tavrel/health/memory.plist: No space left on device; \
 free some space
+  cannot write /run/tavrel/health/nvme0.plist: No space left on device; free some space
 upload: success 0
 metrics: exit-code 1
   tavrelctl: cannot write /run/tavrel/metrics/tavrel.prom: No space left on device; free some space
