@@ -43,7 +43,7 @@ int bindTo(const DatagramSocket& made, const Address& address) {
 std::string_view adviceFor(int code) {
   switch (code) {
     case EADDRINUSE:
-      return "; end or remove what uses it, or give another";
+      return "; stop or remove what uses it, or give another";
     case EMFILE:
       return "; raise the number of files that a process may open (ulimit -n)";
     default:
@@ -57,7 +57,7 @@ Error failure(std::string_view what, int code = errno) {
 
 Expected<DatagramSocket> newSocket(int family) {
   DatagramSocket made(socket(family, SOCK_DGRAM | SOCK_CLOEXEC, 0));
-  if (made.descriptor() < 0) return failure("cannot make a socket");
+  if (made.descriptor() < 0) return failure("cannot create a socket");
   setsockopt(made.descriptor(), SOL_SOCKET, SO_RCVBUF, &kReceiveBuffer, sizeof kReceiveBuffer);
   return made;
 }

@@ -158,7 +158,7 @@ Expected<Configuration> readConfiguration(const DeviceRoot& root, FileSystem& fi
   };
   const auto bytes = files.readIfPresent(path, limits::kSystemFactBytes);
   if (!bytes) return bytes.error();
-  if (!*bytes) return unusable("it is missing: make it as tavrel-upload(8) says");
+  if (!*bytes) return unusable("it is missing: create it as tavrel-upload(8) describes");
   if (const auto reason = reasonToDistrust(path); !reason.empty()) return unusable(reason);
   const auto value = propertyLists.decode(asBytes(**bytes));
   if (!value) return unusable(value.error().message);

@@ -131,7 +131,7 @@ Outcome Uploader::runLocked(bool atOnce) {
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted_.isGiven && permitted == Permission::NotGiven) {
     complain(
-        format("no log is sent: %s of %s is no day: set it to an integer, days since 1970-01-01",
+        format("no log is sent: %s of %s is not a day: set it to an integer, days since 1970-01-01",
                kSubmissionFirstDayKey, kDiagnosticsDomain));
   }
   if (permitted == Permission::NotGiven) return Outcome::Done;
@@ -292,13 +292,13 @@ Uploader::Step Uploader::judge(const WaitingLog& log, const Answer& answer,
         kReceivedHeader);
   } else if (!answer.location.empty()) {
     why += format(
-        " and points to %s: redirects are not followed; "
-        "correct URL, unless this is a login page of the network",
+        " and points to %s: redirects are not followed; correct the URL, unless this is a login "
+        "page of the network",
         percentEncoded(answer.location.substr(0, 200)));
   } else if (status == 400 || status == 401 || status == 403) {
     why += ": check the certificate and the token";
   } else if (status == 404) {
-    why += ": check URL";
+    why += ": check the URL";
   }
   return failToSend(log, why, answer.retryAfter);
 }
@@ -366,7 +366,7 @@ Outcome Uploader::removeWaiting() {
   }
   if (*removed > 0) {
     services_.log.log(LogLevel::Default,
-                      "the permission to send logs is withdrawn: %llu that waited are removed",
+                      "the permission to send logs was withdrawn; waiting logs removed: %llu",
                       std::uint64_t{*removed});
   }
   return Outcome::Done;

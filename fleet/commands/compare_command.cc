@@ -193,10 +193,10 @@ void addCompareCommand(Command top, FleetContext& context) {
   const Command command =
       top.addCommand("compare", "Find the statistics that changed between two OS versions");
   auto options = std::make_shared<CompareOptions>();
-  command.addOption("OLD", options->before, "The version before, or a part of its name")
+  command.addOption("OLD", options->before, "The earlier version, or a part of its name")
       .typeName("")
       .required();
-  command.addOption("NEW", options->after, "The version after").typeName("").required();
+  command.addOption("NEW", options->after, "The later version").typeName("").required();
   addQuestionOptions(command, *options);
   addFormOptions(command, context, *options);
   command.addFlag("--all", options->all, "Also list the statistics that did not change");

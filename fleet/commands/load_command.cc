@@ -78,11 +78,12 @@ void addLoadCommand(Command top, FleetContext& context) {
       .required();
   command
       .addOption("--metadata", options->request.uploadLines,
-                 "Lines of JSON in which a server notes the metadata of uploads")
+                 "Lines of JSON in which a server records the metadata of uploads")
       .typeName("FILE");
   command
-      .addOption("--whitelist", options->request.whitelists,
-                 "Refuse logs with keys that this whitelist, known by its digest, does not name")
+      .addOption(
+          "--whitelist", options->request.whitelists,
+          "Refuse logs whose whitelist is not given here, or does not name one of their keys")
       .typeName("FILE");
   command
       .addOption("--set-aside", options->setAside, "Folder for copies of refused logs with reasons")

@@ -19,7 +19,7 @@ std::size_t devicesAtLeastOf(const QuestionOptions& options) {
     throw UsageError("--devices-at-least: " + std::to_string(wanted) +
                      " is too few: in groups of fewer than " +
                      std::to_string(kFewestDevicesAtLeast) +
-                     " devices, one owner can tell the figures of another");
+                     " devices, one owner can work out the figures of another");
   }
   return wanted;
 }
@@ -29,7 +29,7 @@ std::size_t devicesAtLeastOf(const QuestionOptions& options) {
 void addQuestionOptions(Command command, QuestionOptions& options) {
   command
       .addOption("--days", options.days,
-                 "FIRST..LAST, one day, or a count of days up to the newest; all without it")
+                 "FIRST..LAST, one day, or a number of newest days (default: all)")
       .typeName("DAYS");
   command
       .addOption("--devices-at-least", options.devicesAtLeast,
@@ -92,7 +92,7 @@ std::string Question::readVersion(std::string_view text) const {
     if (!hasPart(version, text)) continue;
     if (found != nullptr) {
       throw std::runtime_error("version \"" + printable(text) +
-                               "\" is part of several versions: write the whole of one of them");
+                               "\" is part of several versions: write one of them in full");
     }
     found = &version;
   }
@@ -124,9 +124,9 @@ std::string tooFewText(std::size_t devicesAtLeast) {
 std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAtLeast) {
   if (joined == 0) return "";
   const std::string why = "groups of fewer than " + std::to_string(devicesAtLeast) + " devices";
-  if (!hasGroups) return "Not divided: the parts would tell of " + why + ".";
+  if (!hasGroups) return "Not divided: the parts would reveal " + why + ".";
   return PartName{PartKind::kOther}.text() + " joins " + std::to_string(joined) +
-         " groups, so that nothing tells of " + why + ".";
+         " groups, so that nothing reveals " + why + ".";
 }
 
 std::string noMeanText() {
@@ -138,8 +138,8 @@ const char* kindText(const PartName& name) {
   switch (name.kind) {
     case PartKind::kWhole:
       return "all";
-    case PartKind::kNotTold:
-      return "not_told";
+    case PartKind::kNotReported:
+      return "not_reported";
     case PartKind::kOther:
       return "other";
     case PartKind::kValue:

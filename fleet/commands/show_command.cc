@@ -37,7 +37,7 @@ void readAgainst(const Question& question, const std::string& text, ShowRequest&
     request.againstVersion = question.readVersion(text);
   } else if (request.againstDays->overlaps(request.days)) {
     throw UsageError("--against: " + textOf(*request.againstDays) + " and " + textOf(request.days) +
-                     " overlap: name days apart with --days");
+                     " overlap: choose separate days with --days");
   }
 }
 

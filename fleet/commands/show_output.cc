@@ -75,13 +75,13 @@ void printFigures(FleetContext& context, const ShowSide& side, std::size_t devic
       {"MAXIMUM", Align::Right, 3}, {"STD DEVIATION", Align::Right, 7}};
   bool hasPercentiles = false;
   bool areLeftOut = false;
-  bool isUntold = false;
+  bool isMissing = false;
   forEachSet(side, [&](const ShownSet& set) {
     const Figures figures = figuresOf(set);
     hasPercentiles = hasPercentiles || set.scalar || !set.histogram.percentiles.empty();
     areLeftOut = areLeftOut || figures.logsWithoutMean != 0;
-    isUntold = isUntold || std::isnan(figures.mean) || std::isnan(figures.minimum) ||
-               std::isnan(figures.maximum) || !figures.deviation;
+    isMissing = isMissing || std::isnan(figures.mean) || std::isnan(figures.minimum) ||
+                std::isnan(figures.maximum) || !figures.deviation;
   });
   for (const unsigned percent : kPercents) {
     const unsigned rank = percent == 50 ? 0 : percent == 25 || percent == 75 ? 4 : 2;
@@ -106,7 +106,7 @@ void printFigures(FleetContext& context, const ShowSide& side, std::size_t devic
   });
   table.print(context.page());
   if (areLeftOut) context.out() << "  " << noMeanText() << "\n";
-  if (isUntold) {
+  if (isMissing) {
     context.out() << "  A figure is - when no log has it, or logs of fewer than " << devicesAtLeast
                   << " devices,\n  or when it is beyond the range of a double.\n";
   }

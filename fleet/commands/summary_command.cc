@@ -155,7 +155,8 @@ void printKeys(FleetContext& context, const QuestionOptions& options,
 }  // namespace
 
 void addSummaryCommand(Command top, FleetContext& context) {
-  const Command summary = top.addCommand("summary", "Tell what logs there are, and of what");
+  const Command summary = top.addCommand(
+      "summary", "Show how many logs there are, and their versions, regions and days");
   auto options = std::make_shared<SummaryOptions>();
   addQuestionOptions(summary, *options);
   addFormOptions(summary, context, *options);

@@ -91,7 +91,8 @@ Expected<LoadCounts> load(Engine& engine, const LoadRequest& request,
     const auto useless = lines.read(path);
     if (!useless) return useless.error();
     if (*useless != 0) {
-      listener.note(format("%s: %zu lines tell of no log that has arrived", path, *useless));
+      listener.note(
+          format("%s: %zu lines ignored: they report no successful upload", path, *useless));
     }
   }
   Loading loading(engine, request, listener);

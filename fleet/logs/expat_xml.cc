@@ -74,9 +74,9 @@ class Reading {
   }
 
   bool start(std::string_view name) {
-    if (value_) return stop(located("an element is inside of a value"));
+    if (value_) return stop(located("an element is inside a value"));
     if (name == "plist") {
-      if (insidePlist_) return stop(located("<plist> is inside of another one"));
+      if (insidePlist_) return stop(located("<plist> is inside another one"));
       return insidePlist_ = true;
     }
     if (!insidePlist_) return stop("is not a property list: it begins with another element");
@@ -105,7 +105,7 @@ class Reading {
       text_.append(text);
       return true;
     }
-    return isSpace(text) || stop(located("text is outside of a value"));
+    return isSpace(text) || stop(located("text is outside a value"));
   }
 
   bool stop(std::string reason) {
@@ -157,7 +157,7 @@ void XMLCALL onEntity(void* reading, const XML_Char*, int, const XML_Char*, int,
   with(reading, [](Reading& self) { return self.stop("declares an entity"); });
 }
 void XMLCALL onSkippedEntity(void* reading, const XML_Char*, int) {
-  with(reading, [](Reading& self) { return self.stop("has an entity that is not known"); });
+  with(reading, [](Reading& self) { return self.stop("has an unknown entity"); });
 }
 
 // Such documents are refused here, because Expat would recognise and convert them.

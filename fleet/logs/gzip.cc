@@ -47,9 +47,9 @@ Status gunzip(ByteSpan bytes, std::size_t limit, std::string& out) {
     } else if (code == Z_MEM_ERROR) {
       throw std::bad_alloc();
     } else if (code == Z_BUF_ERROR || (code == Z_OK && stream.avail_in == 0 && size < out.size())) {
-      return Error{"is cut short: the end of its gzip form is missing"};
+      return Error{"is cut short: the end of its gzip data is missing"};
     } else if (code != Z_OK) {
-      return Error{format("is damaged: its gzip form has %s",
+      return Error{format("is damaged: its gzip data has %s",
                           stream.msg != nullptr ? stream.msg : "an error")};
     }
   }

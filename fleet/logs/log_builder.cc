@@ -142,7 +142,7 @@ bool LogBuilder::takeValue() {
 
 bool LogBuilder::key(std::string_view text) {
   if (levels_.empty() || !levels_.back().isDictionary) {
-    return fail("a key is outside of a dictionary");
+    return fail("a key is outside a dictionary");
   }
   Level& level = levels_.back();
   if (level.hasKey) return fail("a key has no value");
@@ -159,7 +159,7 @@ bool LogBuilder::key(std::string_view text) {
         ++number;
       member_ = static_cast<Member>(number);
       if (member_ == Member::kUnknown) return true;
-      if ((seen_ >> number & 1U) != 0) return fail("is there twice");
+      if ((seen_ >> number & 1U) != 0) return fail("occurs twice");
       seen_ |= 1U << number;
       return true;
     }

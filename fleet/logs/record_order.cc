@@ -43,7 +43,7 @@ const char* histogramFault(std::span<const CellRow> cells, std::uint64_t count) 
   std::uint64_t sum = 0;
   for (std::size_t i = 0; i < cells.size(); ++i) {
     // Each occurrence of a key in the log has its own text.
-    if (cells[i].key.data() != cells[0].key.data()) return "is there twice";
+    if (cells[i].key.data() != cells[0].key.data()) return "occurs twice";
     if (i != 0 && cells[i - 1].upper > cells[i].lower) {
       return cells[i - 1].label == cells[i].label ? "has a bucket twice"
                                                   : "has buckets that overlap";
@@ -58,10 +58,10 @@ const char* histogramFault(std::span<const CellRow> cells, std::uint64_t count) 
 
 std::string putInOrder(LogRecord& record) {
   if (const ScalarRow* const twice = sortByKey(record.scalars)) {
-    return fault("BHScalars", twice->key, "is there twice");
+    return fault("BHScalars", twice->key, "occurs twice");
   }
   if (const DistributionRow* const twice = sortByKey(record.distributions)) {
-    return fault("BHDistributions", twice->key, "is there twice");
+    return fault("BHDistributions", twice->key, "occurs twice");
   }
   sortCells(record.cells);
   auto distribution = record.distributions.begin();

@@ -34,14 +34,14 @@ std::string strengthText(const Comparison& one) {
          " standard deviations of the daily logs";
 }
 
-/// "fewer than 1 of 1,000".
+/// "fewer than 1 in 1,000".
 std::string chanceText(double probability) {
   for (const auto& [limit, text] :
-       {std::pair(1e-6, "fewer than 1 of a million"), std::pair(1e-3, "fewer than 1 of 1,000"),
-        std::pair(1e-2, "fewer than 1 of 100")}) {
+       {std::pair(1e-6, "fewer than 1 in a million"), std::pair(1e-3, "fewer than 1 in 1,000"),
+        std::pair(1e-2, "fewer than 1 in 100")}) {
     if (probability < limit) return text;
   }
-  return "fewer than 1 of 20";
+  return "fewer than 1 in 20";
 }
 
 const char* kindText(KeyKind kind) {
@@ -158,8 +158,8 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   html.text(" beside ");
   html.name(comparison.request.newVersion);
   html.text(
-      ". The dots are the changes of the means in percent, the lines what they may be with a "
-      "certainty of 95 %.");
+      ". The dots are the changes of the means in percent, the lines their 95 % confidence "
+      "intervals.");
   html.end();
 
   page::IntervalChart chart;

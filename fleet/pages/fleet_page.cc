@@ -100,28 +100,29 @@ std::string textOf(const FleetPage& page) {
     if (page.furtherStatistics != 0) {
       html.element("p",
                    "There are " + countText(page.furtherStatistics) +
-                       " more statistics; tavrel-fleet show tells of each.",
+                       " more statistics; tavrel-fleet show prints each of them.",
                    {{"class", "note"}});
     }
   }
   page::HtmlWriter& html = document.section("How to read this page");
-  html.element("p",
-               "A log is one day of one device and does not say which device it is of. So nobody "
-               "can count devices; \"at least\" so many are those that reported on the best day.");
+  html.element(
+      "p",
+      "A log is one day of one device and does not say which device it comes from. So devices "
+      "cannot be counted; \"at least\" gives the number that reported on the busiest day.");
   html.element("p",
                "A percentage over a column of figures is the share of logs, or of values, that are "
-               "not above the figure. Of series only the range is known in which it lies.");
+               "not above the figure. Of series only the range in which it lies is known.");
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
                         " devices are not shown by themselves. Statistics leave such versions out; "
                         "in \"The fleet\" they are joined as \"" +
                         PartName{PartKind::kOther}.text() +
-                        "\", and where they could be told by a subtraction, so is the next larger "
+                        "\", and where a subtraction could reveal them, so is the next larger "
                         "group. Buckets of histograms are joined in the same way.");
   html.element("p",
-               "A change is called one only when a difference of its size would come about by "
-               "chance in fewer than one of twenty such comparisons of all statistics together. "
-               "Versions ran on different days and on devices that chose to update: what differs "
-               "between them need not be their doing.");
+               "A difference is called a change only when chance would produce one of its size in "
+               "fewer than one of twenty such comparisons of all statistics together. Versions ran "
+               "on different days and on devices whose owners chose to update: the version need "
+               "not be the cause of a difference.");
   return document.text();
 }
 

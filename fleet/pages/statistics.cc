@@ -156,7 +156,7 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
       html.text(", ");
     }
     const bool isScalar = answer.request.kind == KeyKind::kScalar;
-    html.text(isScalar ? "one value a log" : "many values a log");
+    html.text(isScalar ? "one value per log" : "many values per log");
     if (!unit.empty()) html.text(", in " + std::string(unit));
     html.end();
     writeSets(html, side, name, unit);

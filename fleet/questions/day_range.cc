@@ -30,7 +30,7 @@ std::string textOf(const DayRange& days) {
 Expected<DayRange> parseDayRange(std::string_view text, std::int32_t newest) {
   const Error fault{
       "\"" + std::string(text) +
-      "\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or a count of days"};
+      "\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or a number of days"};
   if (const auto count = parseNumber<std::uint32_t>(text)) {
     const std::int64_t first = static_cast<std::int64_t>(newest) - *count + 1;
     if (*count == 0 || first < DayRange{}.first) return fault;

@@ -92,7 +92,8 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
     groupOf[value] = groups.size();
     const std::string text =
         byDay ? dateText(civilFromDays(table.days()[value].day)) : texts[value];
-    groups.push_back({{text.empty() ? PartKind::kNotTold : PartKind::kValue, text}, LogSet(table)});
+    groups.push_back(
+        {{text.empty() ? PartKind::kNotReported : PartKind::kValue, text}, LogSet(table)});
   }
   groups.push_back({{PartKind::kOther}, LogSet(table), smallValues});
   for (LogIndex log = 0; log < table.size(); ++log) {

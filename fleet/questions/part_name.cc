@@ -6,7 +6,7 @@ std::string PartName::text() const {
   switch (kind) {
     case PartKind::kWhole:
       return "(all)";
-    case PartKind::kNotTold:
+    case PartKind::kNotReported:
       return "(not reported)";
     case PartKind::kOther:
       return "(other)";

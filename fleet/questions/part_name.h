@@ -8,9 +8,9 @@ namespace tavrel::fleet {
 
 enum class PartKind : std::uint8_t {
   kWhole,
-  kValue,    ///< the logs with one value of an attribute
-  kNotTold,  ///< the logs without the attribute
-  kOther,    ///< logs with several values, none of which may be shown by itself
+  kValue,        ///< the logs with one value of an attribute
+  kNotReported,  ///< the logs without the attribute
+  kOther,        ///< logs with several values, none of which may be shown by itself
 };
 
 struct PartName {

@@ -207,8 +207,8 @@ TEST(EngineFaults, BoundsItsPatience) {
   answerWith("500 Error",
              "Code: 252, e.displayText() = DB::Exception: Too many parts., e.what() = DB::E\n");
   expect("?retries=1",
-         "the server refused: Too many parts: try again later; what is filed already will count "
-         "once",
+         "the server refused: Too many parts: try again later; logs that are already filed will "
+         "count once",
          2);
   answerWith("500 Error", "Code: 8, e.displayText() = DB::Exception: A\nb\x1B[0m, e.what()");
   expect("", "the server refused: A b [0m: check the address and the server's log", 1);
@@ -218,7 +218,7 @@ TEST(EngineFaults, BoundsItsPatience) {
   answer.replace(answer.find(": 1"), 3, ": 9");
   const std::string slow = answer;
   server.closesAfterAnswer = true;
-  expect("", "transfer closed with 8 bytes remaining to read: the answer is incomplete; ask again",
+  expect("", "transfer closed with 8 bytes remaining to read: the answer is incomplete; try again",
          1);
 }
 
@@ -235,12 +235,12 @@ TEST(EngineFaults, TakesRowsOnlyWhole) {
   const std::pair<std::string, std::string> cases[] = {
       {"", ""},
       {block + "\2\0\4kind\5UInt8\4name\6String"s + block, "a bc a bc "},
-      {block.substr(0, block.size() - 1), "the answer is incomplete; ask again"},
+      {block.substr(0, block.size() - 1), "the answer is incomplete; try again"},
       {"\2\x80\x80\x80\x80\x80\x80\x80\x80\x80\1" + block.substr(2),
-       "the answer is incomplete; ask again"},
+       "the answer is incomplete; try again"},
       {block + "Code: 241",
-       "the answer is not of the form that was asked for; check that its tables are those that "
-       "this program made, and ask again"}};
+       "the answer does not have the requested form; check that this program made the tables, "
+       "and try again"}};
   for (const auto& [answer, expected] : cases) {
     body = answer;
     std::string names;

@@ -188,10 +188,9 @@ TEST(DayRangeTest, ReadsWhatPeopleWrite) {
   EXPECT_EQ(read("2026-11-07..2026-11-01"),
             "\"2026-11-07..2026-11-01\" ends before it begins: swap the two days");
   for (const char* wrong : {"", "0", "-1", "x", "2026-11-31", "2026-11-01..x", "99999999999"}) {
-    EXPECT_EQ(read(wrong),
-              "\"" + std::string(wrong) +
-                  "\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
-                  "or a count of days");
+    EXPECT_EQ(read(wrong), "\"" + std::string(wrong) +
+                               "\" is not a range of days: write FIRST..LAST with days as "
+                               "YYYY-MM-DD, or a number of days");
   }
   std::vector<std::string> versions = {
       "Pellio 4.10 (A)", "Pellio 4.9 (B)", "Pellio 4", "", "10", "9"};

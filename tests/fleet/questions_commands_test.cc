@@ -149,7 +149,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   std::string groups;
   for (const auto& group : side["groups"])
     groups += group["part"].dump() + group["group"].dump();
-  EXPECT_EQ(groups, R"x("not_told"null"value""(other)""other"null)x");
+  EXPECT_EQ(groups, R"x("not_reported"null"value""(other)""other"null)x");
   EXPECT_EQ(side["joined"], 2);  // AT and LI, 14 devices
   EXPECT_EQ(side["all"]["values"], 840);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["above"], 100);
@@ -160,7 +160,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,scalar,all days,all,,40,120,0,120,1152921504606846976,"
                              "1152921504606846976,1152921504606846976,0,0,1152921504606846976,,,"));
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,value,(other),13,39,3,78,0,1,"));
-  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,not_told,,13,39,0,78,"));
+  EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,not_reported,,13,39,0,78,"));
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,other,,14,42,0,84,"));
   const std::string buckets = run(file, {"show", kSlow, "--csv", "--buckets", "--by", "os"}).out;
   EXPECT_THAT(buckets, HasSubstr(",all days,all,,,100,480,480\r\n"));
@@ -264,28 +264,27 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
     std::vector<std::string> arguments;
     int status;
     const char* message;
-  } cases[] = {
-      {{"show", "x\x1b"},
-       1,
-       "statistic \"x\\x1b\" is in no log: tavrel-fleet summary --keys lists all"},
-      {{"show", "=sum", "--against", "1"},
-       2,
-       "--against: 2026-11-24 and all days overlap: name days apart with --days"},
-      {{"show", "=sum", "--against", "5.0"},
-       1,
-       "version \"5.0\" is in no log: tavrel-fleet summary lists the versions"},
-      {{"compare", "OS", "4.10"},
-       1,
-       "version \"OS\" is part of several versions: write the whole of one of them"},
-      {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
-      {{"summary", "--days", "0"},
-       2,
-       "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, or "
-       "a count of days"},
-      {{"summary", "--devices-at-least", "2"},
-       2,
-       "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
-       "can tell the figures of another"}};
+  } cases[] = {{{"show", "x\x1b"},
+                1,
+                "statistic \"x\\x1b\" is in no log: tavrel-fleet summary --keys lists all"},
+               {{"show", "=sum", "--against", "1"},
+                2,
+                "--against: 2026-11-24 and all days overlap: choose separate days with --days"},
+               {{"show", "=sum", "--against", "5.0"},
+                1,
+                "version \"5.0\" is in no log: tavrel-fleet summary lists the versions"},
+               {{"compare", "OS", "4.10"},
+                1,
+                "version \"OS\" is part of several versions: write one of them in full"},
+               {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
+               {{"summary", "--days", "0"},
+                2,
+                "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
+                "or a number of days"},
+               {{"summary", "--devices-at-least", "2"},
+                2,
+                "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
+                "can work out the figures of another"}};
   for (const auto& [arguments, status, message] : cases) {
     const Output output = run(file, arguments);
     EXPECT_EQ(output.error, "tavrel-fleet: " + std::string(message) + "\n");

@@ -77,7 +77,7 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
                       "OK queue withheld: empty\n"
                       "OK queue refused: empty\n"
                       "OK upload: no attempt yet\n"
-                      "OK disk: no drive tells its health\n"));
+                      "OK disk: no drive reports its health\n"));
   const auto json = device.json("status --check");
   EXPECT_EQ(json["state"], "ok");
   EXPECT_EQ(json["checks"][2]["figures"]["errors"], 0);

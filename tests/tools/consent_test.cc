@@ -130,7 +130,7 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
                        " is " + wrong + ": " +
                        (*right == 0 ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
                                     : "give 'tavrelctl prefs set " + name + " " + right + "'") +
-                       ", or store it all the same with --force",
+                       ", or store it anyway with --force",
                    2));
     EXPECT_EQ(device.run(set + " --force").status, 0);
   }

@@ -240,8 +240,8 @@ TEST(LiveTest, OneBadFileHidesNothingElse) {
   const Outcome sample = device.run("report sample --group Thermal");
   EXPECT_EQ(sample.status, 0);
   EXPECT_EQ(sample.error,
-            "tavrelctl: 4 channels without values: their devices do not tell them now, or the hub "
-            "does not know them\n");
+            "tavrelctl: 4 channels without values: their devices do not report them now, or the "
+            "hub does not know them\n");
 }
 
 TEST(LiveTest, ARootShowsOnlyItsOwnFolders) {
@@ -282,7 +282,7 @@ TEST(LiveTest, RecordsWhatIsLive) {
   EXPECT_EQ(other.run("report sample").out, live.out);
   EXPECT_EQ(device.run("registry list").out, other.run("registry list").out);
   device.check("registry record --seconds 1 -",
-               fails("--seconds is for --live: recordings are written as they stand", 2));
+               fails("--seconds is for --live: recordings are written as they are", 2));
 }
 
 // Recordings of real machines.

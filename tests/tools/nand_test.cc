@@ -128,8 +128,8 @@ readCountHisto1                     2
 readCountHisto2                     3
 ECBins                              9
 )",
-                     "tavrelctl: standard input: 2 records not listed in full: of unknown "
-                     "statistics, without values or with too many: --json prints them in full\n"}));
+                     "tavrelctl: standard input: 2 records not listed in full (unknown "
+                     "statistics, no values or too many): --json prints them in full\n"}));
   const Outcome parsed = device.run("nand parse - --json", first + "\xab");
   EXPECT_EQ(device.run("nand build - -o -", parsed.out), prints(first + "\xab"));
   EXPECT_EQ(nlohmann::json::parse(parsed.out), R"({"format_version": 1, "result": 1, "fields": {
@@ -164,10 +164,9 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
         second + "0x30000001 is above 0x30000000, the largest number of a statistic");
   parse(good + R"({"key": "ECBins", "count": 4294967295, "values": [1]}, {"hex": "00Ff"}])", 1,
         second + "statistic 54 has 4294967295 values, but there is room for 1");
-  EXPECT_EQ(
-      device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
-      "tavrelctl: standard input: 1 record not listed in full: of unknown statistics, without "
-      "values or with too many: --json prints them in full\n");
+  EXPECT_EQ(device.run("nand parse -", built(device, good + "[805306368, []]]")).error,
+            "tavrelctl: standard input: 1 record not listed in full (unknown statistics, no "
+            "values or too many): --json prints them in full\n");
   EXPECT_EQ(
       device.run("nand parse -", words({4, 1, 1, 0, 0})),
       (Outcome{0, "STATISTIC   VALUE\nhostWrites      1\n",

@@ -50,8 +50,8 @@ TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
   const std::string yesterday = dayDateText(today() - 1);
   expect(textOf(), {"Device on " + yesterday, "Logs may leave the device Not allowed",
                     "Logs that wait All empty", "recorded no scalar on " + yesterday,
-                    "recorded nothing on these days", "No driver of this device tells",
-                    "No drive of this device tells"});
+                    "recorded nothing on these days", "No driver of this device reports",
+                    "No drive of this device reports"});
   EXPECT_EQ(device.run("page -o -").error,
             "tavrelctl: cannot read " + device.path(kWhitelistFile) +
                 ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
@@ -99,9 +99,9 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
   EXPECT_LT(size.size(), 2'000'000U);
   const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
   const std::string text = textOf("--days 400");
-  expect(text, {"There is no room here for 50 distributions more: " + day + " has them all",
+  expect(text, {"Not shown for lack of space: 50 distributions; " + day + " has them all",
                 "1330 statistics more without a chart"});
-  const std::regex left("no room here for (\\d+) (scalars|statistics) more");
+  const std::regex left("lack of space: (\\d+) (scalars|statistics);");
   EXPECT_EQ(
       std::distance(std::sregex_iterator(text.begin(), text.end(), left), std::sregex_iterator()),
       2);
@@ -121,7 +121,7 @@ TEST_F(PageTest, EstimatesHowLongDrivesLast) {
                     "Its rated life is used up", "Not known yet: no wear so far",
                     "About 50 days at the pace of the days on this page",
                     "Not known yet: its wear has not changed on these days",
-                    "Not known: the drive tells no wear", "failing, SMART status is failing"});
+                    "Not known: the drive reports no wear", "failing, SMART status is failing"});
 }
 
 TEST_F(PageTest, RefusesWhatItCannotDo) {

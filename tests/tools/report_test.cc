@@ -171,8 +171,8 @@ TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
   device.check("report sample --group NAND --category 1 --delta --interval 0 --unit 4KiB",
                {0, "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0 MiB\n",
                 "tavrelctl: 1 channel left out, as the change is unknown; the first is "
-                "flash0 <id 0x100000201> NAND Traffic Host reads: a value is not set, or their "
-                "number changed\n"});
+                "flash0 <id 0x100000201> NAND Traffic Host reads: a value is not set, or the "
+                "number of values changed\n"});
 }
 
 TEST_F(ReportTest, DescribesInTheSystemsWords) {

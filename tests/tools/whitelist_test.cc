@@ -29,7 +29,7 @@ TEST(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
     "D": true})"));
   const std::string expected =
       R"(A/DistributionKeys: is an array: a table is a dictionary from keys to options: ignored
-A/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+A/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
 A/ScalarKeys/number: is an integer: options are a dictionary, an empty one to report the value unchanged: ignored
 A/ScalarKeys/options/bucket_interval: is 0: a bucket has a width: the value is not bucketed
 A/ScalarKeys/options/intervals: does not affect scalars: ignored
@@ -38,7 +38,7 @@ A/ScalarKeys/options/sigfig: is not an option: ignored; the options are sig_fig,
 A/ScalarKeys/types/bucket_interval: is 2.5: expected an integer from 0 to 4294967295: used as 2
 A/ScalarKeys/types/sig_fig: is a string: expected an integer: ignored
 A/Scalars: is not a table of a group: ignored; the tables are ScalarKeys, ScalarKeyPrefixes, DistributionKeys, DistributionKeyPrefixes
-B/DistributionKeyPrefixes/e.: lets out the exact minimum and maximum of every distribution that begins so: list keys one by one
+B/DistributionKeyPrefixes/e.: lets out the exact minimum and maximum of every distribution with this prefix: list keys one by one
 B/DistributionKeys/d/intervals: is an integer: expected an array of numbers: no histogram is made
 B/DistributionKeys/d/sig_fig: does not affect distributions: ignored
 B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty
@@ -46,17 +46,17 @@ B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket sta
 B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty
 B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty
 B/ScalarKeyPrefixes/: is the empty prefix: every key begins with it
-B/ScalarKeyPrefixes/: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-B/ScalarKeyPrefixes/p.q.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-B/ScalarKeyPrefixes/p.q.r: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-B/ScalarKeyPrefixes/p.s: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-C/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
-C/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is meant
+B/ScalarKeyPrefixes/: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+B/ScalarKeyPrefixes/p.q.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+B/ScalarKeyPrefixes/p.q.r: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+B/ScalarKeyPrefixes/p.s: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+C/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
+C/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
 D: is a boolean: a group is a dictionary of tables: ignored
-A/ScalarKeys/both: is listed by group C too, which comes later and wins
-B/ScalarKeys/both: is listed by group C too, which comes later and wins
-B/ScalarKeyPrefixes/p.: is listed by group C too, which comes later and wins
+A/ScalarKeys/both: is also listed by group C, which comes later and wins
+B/ScalarKeys/both: is also listed by group C, which comes later and wins
+B/ScalarKeyPrefixes/p.: is also listed by group C, which comes later and wins
 B/ScalarKeyPrefixes/: is hidden by the longer prefix B/ScalarKeyPrefixes/p. for keys that begin with that
 C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. for keys that begin with that
 B/ScalarKeyPrefixes/p.q.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q.r for keys that begin with that
@@ -118,9 +118,9 @@ TEST(WhitelistCheck, LooksAtTheDistributionsOfTheLastWholeDay) {
       "whitelist check",
       (Outcome{
           1,
-          R"(G/DistributionKeys/few: few on 2024-10-04: minimum, maximum, mean and deviation are exact and tell each of its 4 values
+          R"(G/DistributionKeys/few: few on 2024-10-04: minimum, maximum, mean and deviation are exact and reveal each of its 4 values
 G/DistributionKeys/fine: fine on 2024-10-04: intervals are finer than what is recorded: 15 values fill 10 buckets
-G/DistributionKeys/spoilt: spoilt on 2024-10-04: 1 of 15 values make mean and deviation nan, as they are not numbers: mend the program that records them
+G/DistributionKeys/spoilt: spoilt on 2024-10-04: 1 of 15 values make mean and deviation nan, as they are not numbers: fix the program that records them
 )",
           ""}));
   const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
@@ -215,7 +215,7 @@ TEST(WhitelistExplain, NamesTheRuleAndShowsWhatItDoes) {
   scalar        group Apps, exact key
                 reported unchanged
                 -9223372036854775808 is reported as -9223372036854775808
-                group InternalTesting would decide, but it is for internal devices
+                group InternalTesting would apply, but it is for internal devices
   distribution  not reported
 )"}};
   for (const auto& [key, value, text] : kCases)
@@ -229,9 +229,9 @@ TEST(WhitelistExplain, FollowsTaskingAndInternalDevices) {
   device.run("prefs set com.norvane.da Radio false --bool");
   device.check("whitelist explain radio.x", prints(R"(radio.x
   scalar        not reported
-                group Radio would decide, but it is switched off by tasking
+                group Radio would apply, but it is switched off by tasking
   distribution  not reported
-                group Radio would decide, but it is switched off by tasking
+                group Radio would apply, but it is switched off by tasking
 )"));
   device.write("/etc/tavrel/device-answers.plist", xmlOf(R"({"InternalBuild": true})"));
   const auto json = device.json("whitelist explain app.raw other --value 123");

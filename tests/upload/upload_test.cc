@@ -37,7 +37,7 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
       {server, "other", "device", "SSL certificate problem"},
       {format("https://localhost:%d/logs", nginx.port), "ca", "device",
        "no alternative certificate subject name matches"},
-      {server + "s", "ca", "device", "the server answers 404: check URL"}};
+      {server + "s", "ca", "device", "the server answers 404: check the URL"}};
   for (const auto& [url, authority, certificate, why] : faults) {
     device.use(url, nginx.folder, authority, certificate);
     EXPECT_EQ(device.run(true), Outcome::Waits);
@@ -89,8 +89,8 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
       {"201 Created\r\nTavrel-Received: sha-256=:bw==:\r\n", ends + "201" + portal, 300, 600},
       {"202 Accepted\r\n" + received, ends + "202", 300, 600},
       {"302 Found\r\nLocation: http://portal.example/\r\n",
-       ends + "302 and points to http://portal.example/: redirects are not followed; "
-              "correct URL, unless this is a login page of the network",
+       ends + "302 and points to http://portal.example/: redirects are not followed; correct the "
+              "URL, unless this is a login page of the network",
        300, 600},
       {"401 No\r\n", ends + "401: check the certificate and the token", 300, 600},
       {"403 No\r\n", ends + "403: check the certificate and the token", 300, 600},
@@ -211,7 +211,7 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
     EXPECT_EQ(device.names("pending").size(), isWithdrawn ? 0U : 2U);
   }
   const std::tuple<const char*, const char*, std::size_t, std::string> changes[] = {
-      {"<false/>", "", 0, "the permission to send logs is withdrawn: 1 that waited are removed"},
+      {"<false/>", "", 0, "the permission to send logs was withdrawn; waiting logs removed: 1"},
       {"<true/>", "<integer>20785</integer>", 2,
        "logs of earlier days wait: 1; submission is allowed from day 20785 (2026-11-28) on"}};
   for (const auto& [value, firstDay, left, line] : changes) {
@@ -233,7 +233,8 @@ TEST(Upload, JudgesEachLogByItsDay) {
   const std::string kNand = "StorageStatus-20261127T180106Z-5f0c9a1e";
   const std::string wait = "logs of earlier days wait: ";
   const std::string none =
-      "no log is sent: DiagnosticSubmissionFirstDay of com.norvane.zentrix is no day: set it to an "
+      "no log is sent: DiagnosticSubmissionFirstDay of com.norvane.zentrix is not a day: set it to "
+      "an "
       "integer, days since 1970-01-01";
   // The first day, the logs that are sent, and the last line.
   const std::tuple<const char*, std::set<std::string>, std::string> cases[] = {

@@ -32,7 +32,7 @@ void checkDisks(CheckScene& scene) {
     scene.checks.push_back(std::move(check));
   }
   if (disks.empty() && faults.empty())
-    scene.checks.push_back({"disk", "", CheckState::Ok, "no drive tells its health"});
+    scene.checks.push_back({"disk", "", CheckState::Ok, "no drive reports its health"});
 }
 
 }  // namespace tavrel

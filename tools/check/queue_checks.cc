@@ -18,9 +18,9 @@ constexpr CheckFigureKind kOldest{"oldest_timestamp_seconds",
                                   "When the oldest log of a queue was filed."};
 constexpr CheckFigureKind kFailed{"failed_attempts", "tavrel_upload_failed_attempts", "",
                                   "Attempts to upload that failed in a row."};
-constexpr CheckFigureKind kSent{"sent", "tavrel_upload_sent_logs", "", "Logs sent, in all."};
+constexpr CheckFigureKind kSent{"sent", "tavrel_upload_sent_logs", "", "Logs sent in total."};
 constexpr CheckFigureKind kRefused{"refused", "tavrel_upload_refused_logs", "",
-                                   "Logs that the server refused, in all."};
+                                   "Logs that the server refused in total."};
 constexpr CheckFigureKind kSuccess{"success_timestamp_seconds",
                                    "tavrel_upload_success_timestamp_seconds", "seconds",
                                    "When a log was last sent."};

@@ -70,7 +70,7 @@ void examine(CheckScene& scene, const std::string& path, Check& check) {
     return addFinding(check, CheckState::Critical, "damaged: " + found->fault);
   }
   addFinding(check, CheckState::Ok,
-             found->isWhole ? "no damage" : "no damage in the part that there was time for");
+             found->isWhole ? "no damage" : "no damage in the part that was checked in time");
 }
 
 // Files next to the store that need attention.
@@ -105,7 +105,7 @@ void checkStore(CheckScene& scene) {
   } else if (errno == ENOENT || errno == ENOTDIR) {
     addFinding(check, CheckState::Ok, "none yet");
   } else {
-    addFinding(check, CheckState::Unknown, path + " cannot be looked at: run as root");
+    addFinding(check, CheckState::Unknown, path + " cannot be checked: run as root");
   }
   checkCompanions(scene, path, check);
   scene.checks.push_back(std::move(check));

@@ -51,7 +51,7 @@ std::optional<Scope> scopeOf(ToolContext& context, const Arguments& given) {
     fault = given.all ? "--all erases everything: leave --key, --from and --to out"
                       : "name what to erase: --all, or --key PREFIX, --from DAY and --to DAY";
   } else if (hasDays && (given.from.empty() || given.to.empty())) {
-    fault = "give both --from DAY and --to DAY: both days are erased, too";
+    fault = "give both --from DAY and --to DAY: both days are included";
   }
   Scope scope{.rows = {}, .records = !hasPrefix, .logs = given.all, .text = {}};
   if (fault.empty() && hasDays) {
@@ -215,8 +215,8 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const Erased& erase
   }
   if (!rows.isCopied) {
     context.note(
-        "the store is too large to copy: parts of its pages without rows may still have "
-        "single keys or values of what was erased");
+        "the store is too large to copy: unused parts of its pages may still hold keys or values "
+        "that were erased");
   }
   if (scope.logs) return;
   if (rows.damaged > 0) {
@@ -266,7 +266,7 @@ void addEraseCommand(Command app, ToolContext& context) {
   const Command command =
       app.addCommand("erase", "Erase statistics, records and logs that the device keeps");
   command.addFlag("--all", arguments->all,
-                  "All statistics and records, and all logs, sent ones excepted");
+                  "All statistics, records and logs, except logs that were sent");
   command.addOption("--key", arguments->prefix, "Only statistics whose keys begin with this")
       .typeName("PREFIX")
       .check([](const std::string& text) {
@@ -280,7 +280,7 @@ void addEraseCommand(Command app, ToolContext& context) {
   command.addOption("--to", arguments->to, "The last day").typeName("DAY").check(namesADay);
   command.addFlag("--yes", arguments->yes, "Do not ask");
   command.setFooter(
-      "Without --key, the files of structured records of the days go, too. Preferences stay. See\n"
+      "Without --key, the structured records of the days are erased too. Preferences stay. See\n"
       "docs/consent.md.");
   context.addJsonOption(command);
   command.onRun([&context, arguments] { run(context, *arguments); });

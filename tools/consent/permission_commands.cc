@@ -198,7 +198,7 @@ void addAllowCommand(Command app, ToolContext& context) {
 
 void addDenyCommand(Command app, ToolContext& context) {
   const Command command =
-      app.addCommand("deny", "Let no log leave the device, and delete those that wait");
+      app.addCommand("deny", "Withdraw the permission, and delete the logs that wait");
   context.addJsonOption(command);
   command.onRun([&context] { deny(context); });
 }

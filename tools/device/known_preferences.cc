@@ -87,9 +87,9 @@ std::string faultOfPreference(std::string_view domain, std::string_view key,
   const std::string cure = isPermission ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
                                         : format("give 'tavrelctl prefs set %s %s %s'", domain, key,
                                                  known->form.example);
-  return format(
-      "preference %s of domain %s is %s, not %s: %s, or store it all the same with --force", key,
-      domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value), cure);
+  return format("preference %s of domain %s is %s, not %s: %s, or store it anyway with --force",
+                key, domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value),
+                cure);
 }
 
 }  // namespace tavrel

@@ -109,8 +109,8 @@ void tidy(ToolContext& context, bool isQuiet) {
 }  // namespace
 
 void addLimitsCommand(Command app, ToolContext& context) {
-  const Command command =
-      app.addCommand("limits", "Show what the device holds, beside its limits (docs/limits.md)");
+  const Command command = app.addCommand(
+      "limits", "Show how much the device keeps, beside its limits (docs/limits.md)");
   context.addJsonOption(command);
   command.onRun([&context] { showLimits(context); });
 }

@@ -56,14 +56,14 @@ std::string permissionNote(const Arguments& arguments, const SubmissionPermissio
   if (arguments.domain != kDiagnosticsDomain) return {};
   if (arguments.key == kSubmissionEnabledKey && (!now.isGiven || !former.isGiven)) {
     return now.isGiven
-               ? "this counts at once, also for what is recorded already: 'tavrelctl allow' "
+               ? "this takes effect at once, even for what is already recorded: 'tavrelctl allow' "
                  "begins with the next day"
                : "logs that wait stay until the next run: 'tavrelctl deny' deletes them";
   }
   const bool isEarlier =
       former.isGiven && former.firstDay && now.covers(std::int64_t{*former.firstDay} - 1);
   if (arguments.key == kSubmissionFirstDayKey && isEarlier) {
-    return "what was recorded earlier may leave now, too: 'tavrelctl deny', then 'tavrelctl "
+    return "what was recorded earlier may leave now too: 'tavrelctl deny', then 'tavrelctl "
            "allow', "
            "begins with the next day";
   }
@@ -240,7 +240,7 @@ void addPrefsCommands(Command app, ToolContext& context) {
   setCommand.addOption("VALUE", arguments->value, "The value").required();
   addKindOptions(setCommand, arguments);
   setCommand.addFlag("--force", arguments->force,
-                     "Store also what the system would not read as that preference");
+                     "Store the value even if the system would not read it as that preference");
 
   const Command deleteCommand = add("delete", "Remove a key", remove);
   addDomain(deleteCommand).required();

@@ -159,7 +159,7 @@ void addNotifyCommands(Command app, ToolContext& context) {
 
   const Command waitCommand = group.addCommand("wait", "Wait until a notification is posted");
   waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging").required();
-  waitCommand.addOption("--timeout", *timeout, "Give up after so long, with exit status 1")
+  waitCommand.addOption("--timeout", *timeout, "Give up after this time, with exit status 1")
       .typeName("SECONDS");
   context.addJsonOption(waitCommand);
   waitCommand.onRun([&context, name, timeout] { wait(context, *name, *timeout); });

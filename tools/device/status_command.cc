@@ -148,7 +148,7 @@ void addStatusCommand(Command app, ToolContext& context) {
       app.addCommand("status", "Show the permission, the last run, the store and the pending logs");
   const auto checks = std::make_shared<bool>(false);
   command.addFlag("--check", *checks,
-                  "Judge each: exit status 0 ok, 1 warning, 2 critical, 3 unknown");
+                  "Check everything: exit status 0 ok, 1 warning, 2 critical, 3 unknown");
   context.addJsonOption(command);
   command.onRun([&context, checks] {
     if (*checks) return showChecks(context);

@@ -155,7 +155,7 @@ void showDisks(ToolContext& context, bool showsSources) {
       list.push_back(jsonOf(disk, showsSources));
     context.printJson({{"disks", std::move(list)}});
   } else if (disks.empty()) {
-    context.out() << "no drive tells its health\n";
+    context.out() << "no drive reports its health\n";
   } else {
     printTable(context, disks);
     if (showsSources) printFigures(context, disks);
@@ -171,11 +171,12 @@ void addDisksCommand(Command app, ToolContext& context) {
   };
   const auto arguments = std::make_shared<Arguments>();
   const Command command = app.addCommand("disks", "Show the health of the drives");
-  command.addFlag("--all", arguments->all, "Also each figure with its source and meaning");
+  command.addFlag("--all", arguments->all, "Also show each figure with its source and meaning");
   context.addJsonOption(command);
   command.setFooter(
-      "Exit status, the sum of: 1 a reading is unusable; 4 a drive is unread; 8 failing; 16 worn; "
-      "32 has errors; 64 its reading is old. 2 is for usage.");
+      "Exit status, the sum of: 1 a reading is unusable; 4 a drive was not read; 8 failing; 16 "
+      "worn; "
+      "32 has errors; 64 its reading is old. 2 means wrong usage.");
   command.onRun([&context, arguments] { showDisks(context, arguments->all); });
 }
 

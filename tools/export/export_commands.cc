@@ -41,7 +41,7 @@ void exportMetrics(ToolContext& context, const Arguments& arguments) {
 }  // namespace
 
 void addExportCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("export", "Write figures in the forms of other programs");
+  const Command group = app.addGroup("export", "Write figures in the formats of other programs");
   const auto arguments = std::make_shared<Arguments>();
   const Command metrics = group.addCommand(
       "openmetrics", "Write statistics, channels, drives and tavrel's own state as metrics");

@@ -20,14 +20,14 @@ void exportFigures(const Disk& disk, const Figures& figures, std::string_view en
     const MetricLabels labels{{"disk", disk.reading.name},
                               {"figure", std::string(figure.kind->name).append(ending)}};
     if (figure.kind->unit == kBytes) {
-      page.gauge({"tavrel_disk_figure_bytes", "bytes", "Figures of drives that are sizes."}, labels,
+      page.gauge({"tavrel_disk_figure_bytes", "bytes", "Figures of drives: sizes."}, labels,
                  figure.value);
     } else if (figure.kind->unit == kMillidegrees) {
       page.gauge({"tavrel_disk_figure_celsius", "celsius", "Figures of drives: temperatures."},
                  labels, static_cast<double>(figure.value) / 1000);
     } else {
-      page.gauge({"tavrel_disk_figure", "", "Other figures of drives: the name says which."},
-                 labels, figure.value);
+      page.gauge({"tavrel_disk_figure", "", "Figures of drives: all others."}, labels,
+                 figure.value);
     }
   }
 }
@@ -68,9 +68,9 @@ void exportChecks(ToolContext& context, MetricPage& page) {
   for (const Check& check : checkDevice(context, kExamination)) {
     MetricLabels labels{{"check", std::string(check.name)}};
     if (!check.subject.empty()) labels.emplace_back("subject", check.subject);
-    page.gauge({"tavrel_check_state", "",
-                "State of each thing looked at: 0 ok, 1 warning, 2 critical, 3 unknown."},
-               labels, static_cast<std::int64_t>(check.state));
+    page.gauge(
+        {"tavrel_check_state", "", "State of each check: 0 ok, 1 warning, 2 critical, 3 unknown."},
+        labels, static_cast<std::int64_t>(check.state));
     const std::string label = labelName(check.name);
     labels.clear();
     if (!check.subject.empty()) labels.emplace_back(label, check.subject);

@@ -179,7 +179,7 @@ void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs
   const auto value = bytes ? plist::read(asBytes(*bytes)) : Expected<plist::Value>(bytes.error());
   const bool isThere = value && !value->dictionary().empty();
   std::string reason = isThere ? path + ": it could not be read at first: run the command again"
-                       : value ? path + ": it is empty or no dictionary"
+                       : value ? path + ": it is empty or not a dictionary"
                                : value.error().message;
   if (bytes && !value) reason = path + ": " + reason;
   // Unreadable metadata is a failure; missing metadata may just be the result of a kill.

@@ -164,7 +164,7 @@ void addLogCommands(Command app, ToolContext& context) {
 
   const Command previewCommand = group.addCommand(
       "preview",
-      "Print the document that a run would submit, permission given or not; changes nothing");
+      "Print the document that a run would submit, with or without permission; changes nothing");
   previewCommand
       .addOption("--day", arguments->day,
                  "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
@@ -188,7 +188,7 @@ void addLogCommands(Command app, ToolContext& context) {
                  "or latest, the last daily one")
       .showDefault();
   const Option raw =
-      showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes as they are");
+      showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes unchanged");
   raw.excludes(context.addJsonOption(showCommand));
   showCommand.onRun([&context, arguments] { show(context, *arguments); });
 }

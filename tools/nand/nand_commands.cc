@@ -104,8 +104,8 @@ void parse(ToolContext& context, const Arguments& arguments) {
   if (context.json()) return printStatisticsJson(context.out(), result, statistics, buffer);
   if (const auto unlisted = printStatistics(context.page(), statistics, buffer); unlisted > 0) {
     context.note(
-        format("%s: %s not listed in full: of unknown statistics, without values or with too many: "
-               "--json prints them in full",
+        format("%s: %s not listed in full (unknown statistics, no values or too many): --json "
+               "prints them in full",
                nameOf(arguments.file), counted(unlisted, "record")));
   }
 }

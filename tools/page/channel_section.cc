@@ -74,7 +74,7 @@ void writeStates(PageScene& scene) {
       channels.emplace_back(channel, std::move(shares));
   }
   if (channels.empty()) {
-    html.element("p", "No driver of this device tells how long its states lasted.");
+    html.element("p", "No driver of this device reports how long its states lasted.");
     return;
   }
   html.element("p", "How the time was spent since the drivers began to count.");

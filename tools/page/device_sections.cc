@@ -138,9 +138,9 @@ void writeHealth(PageScene& scene, const std::vector<Check>& checks) {
 void writeNotes(PageScene& scene) {
   page::HtmlWriter& html = scene.document.section("About this page");
   html.element("p",
-               "The figures of this page are exact, also those that leave the device in a coarser "
-               "form or not at all: give it to nobody who may not know them. What a log has is "
-               "worked out with the whitelist as it is now. Days are those of UTC. The page loads "
+               "The figures of this page are exact, even those that leave the device in a coarser "
+               "form or not at all: give the page only to people who may know them. What a log has "
+               "is worked out with the current whitelist. Days are UTC days. The page loads "
                "nothing from a network and sends nothing.");
   const auto missing = [&html](std::string_view text) {
     html.begin("p", {{"class", "bad"}});
@@ -166,7 +166,7 @@ void writeLeftOut(page::HtmlWriter& html, std::uint64_t count, std::string_view 
                   std::string_view where) {
   if (count == 0) return;
   html.begin("p", {{"class", "note"}});
-  html.text(format("There is no room here for %s more: ", counted(count, what)));
+  html.text(format("Not shown for lack of space: %s; ", counted(count, what)));
   html.element("code", where);
   html.text(" has them all.");
   html.end();

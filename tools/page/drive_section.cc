@@ -68,7 +68,7 @@ std::string yearsText(double days) {
 
 std::string lifetimeText(const PageScene& scene, const Disk& disk) {
   const auto wear = wearOf(disk);
-  if (!wear) return "Not known: the drive tells no wear";
+  if (!wear) return "Not known: the drive reports no wear";
   if (wear->percent >= 100) return "Its rated life is used up";
   const auto byTrend = [&](std::int64_t leastGrowth) -> std::optional<std::string> {
     const auto days = daysLeftByTrend(scene, disk, *wear, leastGrowth);
@@ -150,7 +150,7 @@ void writeDrives(PageScene& scene) {
     html.end();
   }
   if (disks.empty()) {
-    html.element("p", "No drive of this device tells its health.");
+    html.element("p", "No drive of this device reports its health.");
     return;
   }
   std::size_t written = 0;

@@ -125,8 +125,8 @@ void writeTrends(PageScene& scene) {
   }
   html.element(
       "p",
-      "Exact figures. A gap is a day on which the device reported nothing. Of a distribution "
-      "the line is the mean, and the area reaches from the lowest to the highest value.");
+      "Exact figures. A gap is a day on which the device recorded nothing. For a distribution the "
+      "line is the mean, and the area reaches from the lowest to the highest value.");
   const std::size_t count = trends.size();
   std::size_t written = 0;
   html.begin("div", {{"class", "cards"}});

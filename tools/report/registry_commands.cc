@@ -138,7 +138,7 @@ void show(ToolContext& context, const Arguments& arguments) {
 
 void record(ToolContext& context, const Arguments& arguments) {
   if (arguments.seconds > 0 && !arguments.live) {
-    return context.failUsage("--seconds is for --live: recordings are written as they stand");
+    return context.failUsage("--seconds is for --live: recordings are written as they are");
   }
   const CurrentRecording current =
       arguments.live ? CurrentRecording{recordLive(context, arguments.seconds), true}
@@ -182,17 +182,19 @@ void addRegistryCommands(Command app, ToolContext& context) {
   context.addJsonOption(addCommand(group, "list", "List the services", arguments, context, list));
 
   const Command shown =
-      addCommand(group, "show", "Show everything of one service", arguments, context, show);
+      addCommand(group, "show", "Show everything about one service", arguments, context, show);
   shown.addOption("ID", arguments->id, "Its entry id, decimal or with 0x").required();
   context.addJsonOption(shown);
 
-  const Command recorded = addCommand(
-      group, "record", "Write all recordings, or what is live, as one", arguments, context, record);
+  const Command recorded =
+      addCommand(group, "record", "Write all recordings, or the live services, as one recording",
+                 arguments, context, record);
   recorded.addFlag("--live", arguments->live,
                    "What this machine shows now, in place of the recordings");
   recorded
-      .addOption("--seconds", arguments->seconds,
-                 "With --live: go on for so long, a sample a second (default 0, at most 3600)")
+      .addOption(
+          "--seconds", arguments->seconds,
+          "With --live: continue for N seconds, a sample per second (default 0, at most 3600)")
       .typeName("N")
       .check(secondsFault);
   recorded

@@ -188,7 +188,7 @@ void addReportCommands(Command app, ToolContext& context) {
   sampled.addOption("--count", arguments->count, "How many samples (default 1)")
       .typeName("N")
       .check(countFault);
-  sampled.addFlag("--delta", arguments->delta, "Show what changed since the sample before");
+  sampled.addFlag("--delta", arguments->delta, "Show what changed since the previous sample");
   context.addJsonOption(sampled);
 
   const Command described = addCommand(group, "describe", "Print the system's own descriptions",

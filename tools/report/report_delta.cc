@@ -50,7 +50,7 @@ PartialDelta subtractEach(const plist::Dictionary& previous, const plist::Dictio
     if (delta.leftOut++ > 0) continue;
     delta.firstLeftOut =
         format("%s: %s", placeOf(channel),
-               reasonOf(error).value_or("a value is not set, or their number changed"));
+               reasonOf(error).value_or("a value is not set, or the number of values changed"));
   }
   return delta;
 }

@@ -61,7 +61,7 @@ std::int32_t Sampler::missing(const plist::Dictionary& samples) const {
 
 const char* Sampler::reasonForMissing() const {
   const bool isAnyLive = !context_.linuxPlatform().registry().liveServices().empty();
-  return isAnyLive ? "their devices do not tell them now, or the hub does not know them"
+  return isAnyLive ? "their devices do not report them now, or the hub does not know them"
                    : "the hub does not know them";
 }
 

@@ -88,11 +88,11 @@ void addStatCommands(Command app, ToolContext& context) {
       arguments, context,
       [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
   import.addOption("FILE", arguments->file,
-                   "All of it is kept, or nothing; - is standard input (default)");
+                   "Lines to import, all or none; - is standard input (default)");
   import.setFooter(
-      "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar replaces\n"
-      "that of its day. Values are added to those of their day: importing a file twice doubles\n"
-      "them.");
+      "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar "
+      "replaces\nthe one of its day. Values are added to those of their day: importing a file "
+      "twice\ndoubles them.");
   context.addJsonOption(import);
 
   const Command exported =
@@ -147,22 +147,23 @@ void addStatCommands(Command app, ToolContext& context) {
   const Option seconds =
       collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
           .typeName("N");
-  const Option once = collected
-                          .addFlag("--once", arguments->once,
-                                   "Take one sample, with rates since the last run of this kind")
-                          .excludes(seconds);
+  const Option once =
+      collected
+          .addFlag("--once", arguments->once,
+                   "Take one sample, with rates since the last run with --once or --every")
+          .excludes(seconds);
   collected
       .addOption("--every", arguments->period,
-                 "Take a sample every N seconds until a signal comes, going on from the last run "
-                 "of this kind or of --once")
+                 "Take a sample every N seconds until a signal arrives, continuing from the last "
+                 "run with --every or --once")
       .typeName("N")
       .check(periodFault)
       .excludes(seconds)
       .excludes(once);
   collected
       .addOption("--state", arguments->stateFile,
-                 "What --once and --every leave for the next run "
-                 "(default /run/tavrel/collect.state)")
+                 "File in which --once and --every leave a reading for the next run (default "
+                 "/run/tavrel/collect.state)")
       .typeName("FILE");
   collected.setFooter(std::string(collectedKeysHelp()));
 }

@@ -29,7 +29,7 @@ void foldStatistics(ToolContext& context) {
     if (report.waiting > 0) out << ", " << report.waiting << " left for the next fold";
     out << '\n';
     if (report.dropped > 0) {
-      out << "dropped by programs without room: " << counted(report.dropped, "value") << '\n';
+      out << "dropped by programs for lack of space: " << counted(report.dropped, "value") << '\n';
     }
     if (report.refused > 0 || report.segmentsRefused > 0) {
       out << "refused: " << counted(report.refused, "value") << ", "

@@ -129,10 +129,10 @@ class Checker {
       }
       if (isForAll_ && !isDistributionTable(table) && coarsensNoScalar(rule.value.dictionary())) {
         add("is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is "
-            "meant");
+            "intended");
       }
       if (isForAll_ && table == WhitelistTable::DistributionPrefixes) {
-        add("lets out the exact minimum and maximum of every distribution that begins so: list "
+        add("lets out the exact minimum and maximum of every distribution with this prefix: list "
             "keys one by one");
       }
       for (const plist::Entry& option : rule.value.dictionary()) {
@@ -216,7 +216,7 @@ void findRivals(const std::vector<WhitelistRule>& rules, Findings& findings) {
   for (const WhitelistRule& rule : rules) {
     const std::string_view winner = winners[rule.key];
     if (winner == rule.group) continue;
-    findings.add(pathOfRule(rule), format("is listed by group %s too, which comes later and wins",
+    findings.add(pathOfRule(rule), format("is also listed by group %s, which comes later and wins",
                                           shownName(winner)));
   }
 }

@@ -126,7 +126,8 @@ void addWhitelistCommands(Command app, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
 
   const Command checkCommand = group.addCommand(
-      "check", "Report what has no effect or coarsens nothing; exit status 1 if there is anything");
+      "check",
+      "Report entries that have no effect or do not coarsen; exit status 1 if there are any");
   checkCommand.addOption("FILE", arguments->file,
                          "Whitelist (default: the device's own); - is standard input");
   context.addJsonOption(checkCommand);
@@ -140,7 +141,7 @@ void addWhitelistCommands(Command app, ToolContext& context) {
   diffCommand.onRun([&context, arguments] { diff(context, *arguments); });
 
   const Command explainCommand =
-      group.addCommand("explain", "Show which rule decides about a key, and its options");
+      group.addCommand("explain", "Show which rule applies to a key, and its options");
   explainCommand.addOption("KEY", arguments->keys, "Statistics keys").required();
   explainCommand.addOption("--value", arguments->value, "Also show how this value is coarsened")
       .typeName("N");

@@ -60,13 +60,13 @@ class DataCheck {
     const std::string which = format("%s on %s", key, dayDateText(day));
     const std::string counts = counted(static_cast<std::uint64_t>(shown.values), "value");
     if (shown.notNumbers > 0) {
-      add(*rule, format("%s: %lld of %s make mean and deviation nan, as they are not numbers: mend "
+      add(*rule, format("%s: %lld of %s make mean and deviation nan, as they are not numbers: fix "
                         "the program that records them",
                         which, shown.notNumbers, counts));
     }
     if (shown.values > 0 && shown.values <= kKnownFromSummary) {
       add(*rule,
-          format("%s: minimum, maximum, mean and deviation are exact and tell each of its %s",
+          format("%s: minimum, maximum, mean and deviation are exact and reveal each of its %s",
                  which, counts));
     } else if (shown.buckets >= kFewBuckets && 2 * shown.buckets > shown.values) {
       add(*rule, format("%s: intervals are finer than what is recorded: %s fill %lld buckets",

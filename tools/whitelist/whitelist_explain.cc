@@ -87,7 +87,7 @@ void printKind(std::ostream& out, const KindExplanation& kind, bool isScalar,
   if (!effect.empty()) out << kContinuation << printable(effect) << '\n';
   if (!kind.idleGroup.empty()) {
     out << kContinuation
-        << printable(format("group %s would decide, but %s", kind.idleGroup, kind.idleReason))
+        << printable(format("group %s would apply, but %s", kind.idleGroup, kind.idleReason))
         << '\n';
   }
 }

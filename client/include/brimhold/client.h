@@ -52,7 +52,7 @@ extern "C" {
 typedef struct BHClientScalarKey BHClientScalarKey;
 typedef struct BHClientDistributionKey BHClientDistributionKey;
 
-/* Looks a key up; the same name gives the same handle. The name is copied. Never returns NULL: the
+/* Looks up a key; the same name gives the same handle. The name is copied. Never returns NULL: the
  * values of a refused key are dropped. A key is refused when it is NULL, empty or longer than 1024
  * bytes, has control characters, or the process has 4096 keys already. The other calls accept NULL,
  * and drop the value. */

@@ -44,8 +44,8 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
       const NativeBlock::Found found = block.find(std::string_view(bytes).substr(taken), kTypes);
       if (found == NativeBlock::Found::kOther) {
         throw EngineError(server.address().name +
-                          ": the answer is not of the form that was asked for; check that its "
-                          "tables are those that this program made, and ask again");
+                          ": the answer does not have the requested form; check that this program "
+                          "made the tables, and try again");
       }
       if (found == NativeBlock::Found::kPart) break;
       visitBlock<Row>(block, visit, fields...);
@@ -66,7 +66,7 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
   });
   takeBlocks();
   if (!bytes.empty())
-    throw EngineError(server.address().name + ": the answer is incomplete; ask again");
+    throw EngineError(server.address().name + ": the answer is incomplete; try again");
 }
 
 std::string whereKey(std::string_view key) {

@@ -147,7 +147,7 @@ void Server::refuse(std::string_view answer, long status) const {
                          : "the server refused: " + reason;
   if (status >= 502 ||
       std::find(kPassingCodes.begin(), kPassingCodes.end(), code) != kPassingCodes.end())
-    throw PassingError(text + ": try again later; what is filed already will count once");
+    throw PassingError(text + ": try again later; logs that are already filed will count once");
   if (status == 401 || code == 192 || code == 193 || code == 194 || code == 516)
     throw ServerError(code, text + ": check the user and the password in the address");
   throw ServerError(code, text + ": check the address and the server's log");
@@ -172,7 +172,7 @@ void Server::perform(const std::string& url, std::string_view body, bool isRepea
   if (code != CURLE_OK) {
     const std::string text =
         address_.name + ": " + (words[0] != '\0' ? words.data() : curl_easy_strerror(code));
-    if (transfer.handedOut) throw EngineError(text + ": the answer is incomplete; ask again");
+    if (transfer.handedOut) throw EngineError(text + ": the answer is incomplete; try again");
     throw PassingError(text + ": check that the server runs and can be reached, and try again");
   }
   long status = 0;

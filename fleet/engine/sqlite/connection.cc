@@ -16,7 +16,8 @@ const char* adviceFor(int code) {
   switch (code & 0xFF) {
     case SQLITE_BUSY:
     case SQLITE_LOCKED:
-      return "another program has been writing to it for long; try again when that has ended";
+      return "another program has been writing to it for a long time; try again when that has "
+             "ended";
     case SQLITE_CORRUPT:
     case SQLITE_NOTADB:
       return "it is damaged; load the logs into a new file";
@@ -31,7 +32,7 @@ const char* adviceFor(int code) {
     case SQLITE_CONSTRAINT:
       return "its tables are not as this program made them; load the logs into a new file";
     case SQLITE_NOMEM:
-      return "load or ask for less at once";
+      return "load or query less at once";
     default:
       return "check the file system that holds it";
   }

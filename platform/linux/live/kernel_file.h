@@ -67,7 +67,7 @@ std::vector<std::string> namesIn(const std::string& folder);
 
 bool exists(const std::string& path);
 bool isFolder(const std::string& path);
-/// The last part of the link's target; empty when it is no link.
+/// The last part of the link's target; empty when it is not a link.
 std::string linkedName(const std::string& path);
 
 }  // namespace tavrel::live

@@ -25,7 +25,7 @@ struct Scale {
 /// Nothing for other text. Numbers that do not fit 64 signed bits become the largest one.
 std::optional<std::int64_t> parseNumber(std::string_view text);
 
-/// `parseNumber` in the channel's unit; `kUnset` when it is no number.
+/// `parseNumber` in the channel's unit; `kUnset` when it is not a number.
 std::int64_t scaledNumber(std::string_view text, Scale scale);
 
 /// The sum of two values, neither of them `kUnset`, limited to the largest number.

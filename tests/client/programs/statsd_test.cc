@@ -29,7 +29,7 @@ void send(int family, const Address& address, const std::vector<std::string>& da
   }
 }
 
-const std::string kInUse = ": Address already in use; end or remove what uses it, or give another";
+const std::string kInUse = ": Address already in use; stop or remove what uses it, or give another";
 
 class Statsd : public Recording {
  protected:
@@ -183,7 +183,7 @@ TEST(StatsdSockets, SayWhenNoDescriptorIsLeft) {
   const auto made = openLoopbackSocket(0);
   setrlimit(RLIMIT_NOFILE, &before);
   EXPECT_EQ(made.error().message,
-            "cannot make a socket: Too many open files; raise the number of files that a process "
+            "cannot create a socket: Too many open files; raise the number of files that a process "
             "may open (ulimit -n)");
 }
 

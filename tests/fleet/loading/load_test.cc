@@ -145,7 +145,8 @@ TEST_F(LoadTest, TakesAServersUploads) {
                          "{\"half\":\n" + line("device-9", "413", "Pellio 6", ""));
   const Outcome outcome =
       run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
-  EXPECT_EQ(outcome.error, "tavrel-fleet: lines.log: 2 lines tell of no log that has arrived\n");
+  EXPECT_EQ(outcome.error,
+            "tavrel-fleet: lines.log: 2 lines ignored: they report no successful upload\n");
   EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind\n");
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||"}));

@@ -131,16 +131,16 @@ TEST(LogReaderTest, NamesWhatIsWrong) {
       {"BHScalars", "BHOther", "is not a tallied log: it has no BHScalars"},
       {"<integer>1</integer>", "<integer>2</integer>",
        "BHCrashLogVersion: is a version that this program does not know"},
-      {"BHTasking", "BHScalars", "BHScalars: is there twice"},
-      {"BHTasking</key>\n\t<array/>", "BHMetadata</key>\n\t<array/>", "BHMetadata: is there twice"},
+      {"BHTasking", "BHScalars", "BHScalars: occurs twice"},
+      {"BHTasking</key>\n\t<array/>", "BHMetadata</key>\n\t<array/>", "BHMetadata: occurs twice"},
       {"<integer>12000</integer>", "<real>12000</real>",
        "BHScalars/com.example.starts: is not an integer"},
       {"12000", "9223372036854775808", "BHScalars/com.example.starts: exceeds 64 bits with a sign"},
       {"12000", "12x", "BHScalars/com.example.starts: \"12x\" is not a 64-bit integer"},
       {"com.example.starts", "com.example.a&lt;b&amp;c",
-       "BHScalars/com.example.a<b&c: is there twice"},
+       "BHScalars/com.example.a<b&c: occurs twice"},
       {"<key>com.example.load</key>", "<key>com.example.delay</key>",
-       "BHDistributions/com.example.delay: is there twice"},
+       "BHDistributions/com.example.delay: occurs twice"},
       {"<real>1</real>", "", "BHDistributions/com.example.delay: is not an array of five numbers"},
       {"<integer>4</integer>", "<real>4</real>",
        "BHDistributions/com.example.delay: is not a summary whose count is an integer"},
@@ -194,7 +194,7 @@ TEST(LogReaderTest, NamesWhatIsWrong) {
       {"<key>BHUserSetRegionFormat</key>\n\t\t<string>AT</string>", "<key>x</key>",
        "BHMetadata/x: the last key of a dictionary has no value"},
       {"<date>2026-11-25T03:04:05Z</date>", "<true/>", "BHLogCreationDate: is not a date"},
-      {"<array/>", "<real>1</real>x", "line 77, column 16: text is outside of a value"},
+      {"<array/>", "<real>1</real>x", "line 77, column 16: text is outside a value"},
       {"2026-11-24T00:00:00Z", "2026-11-24T00:00:01Z",
        "BHStartDate: is not the beginning of a day"},
       {"2026-11-24T", "1970-01-01T", "BHStartDate: is not within the years 2000 to 2099"},
@@ -250,9 +250,9 @@ TEST(LogReaderTest, RefusesWhatIsNoWholeDocument) {
   }
   const std::string packed = gzipped(kSampleLog);
   EXPECT_EQ(faultIn(packed.substr(0, packed.size() - 1)),
-            "is cut short: the end of its gzip form is missing");
+            "is cut short: the end of its gzip data is missing");
   EXPECT_EQ(faultIn(packed.substr(0, 40) + "#" + packed.substr(41)).substr(0, 30),
-            "is damaged: its gzip form has ");
+            "is damaged: its gzip data has ");
 }
 
 TEST(LogReaderTest, BoundsWhatALogMayCost) {
