@@ -29,7 +29,7 @@ std::size_t devicesAtLeastOf(const QuestionOptions& options) {
 void addQuestionOptions(Command command, QuestionOptions& options) {
   command
       .addOption("--days", options.days,
-                 "FIRST..LAST, one day, or a number of newest days (default: all)")
+                 "FIRST..LAST, one day, or a number of days up to the newest (default: all)")
       .typeName("DAYS");
   command
       .addOption("--devices-at-least", options.devicesAtLeast,
