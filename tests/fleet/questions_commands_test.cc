@@ -249,13 +249,14 @@ TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
 
 TEST_F(QuestionCommands, AreOnTheManualPage) {
   root.write("/page.in", "@command page\nProse.\n");
-  EXPECT_EQ(run(file, {"completion", "man", root.root.path("/page.in")}).out,
-            ".TP\n\\fBpage\\fR \\fB\\-\\-output\\fR \\fIFILE\\fR [\\fB\\-\\-days\\fR \\fIDAYS\\fR] "
-            "[\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR]\nProse.\n.RS\n.TP\n\\fB\\-o\\fR, "
-            "\\fB\\-\\-output\\fR \\fIFILE\\fR\nThe page; \\- is standard output.\n.TP\n"
-            "\\fB\\-\\-days\\fR \\fIDAYS\\fR\nFIRST..LAST, one day, or a count of days up to the "
-            "newest; all without it.\n.TP\n\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR\nShow no "
-            "group of fewer devices (default 10, at least 3).\n.RE\n");
+  EXPECT_EQ(
+      run(file, {"completion", "man", root.root.path("/page.in")}).out,
+      ".TP\n\\fBpage\\fR \\fB\\-\\-output\\fR \\fIFILE\\fR [\\fB\\-\\-days\\fR \\fIDAYS\\fR] "
+      "[\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR]\nProse.\n.RS\n.TP\n\\fB\\-o\\fR, "
+      "\\fB\\-\\-output\\fR \\fIFILE\\fR\nThe page; \\- is standard output.\n.TP\n"
+      "\\fB\\-\\-days\\fR \\fIDAYS\\fR\nFIRST..LAST, one day, or a number of days up to "
+      "the newest (default: all).\n.TP\n\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR\nShow no "
+      "group of fewer devices (default 10, at least 3).\n.RE\n");
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
