@@ -91,7 +91,9 @@ TEST(NumberTest, IsShortAndHasItsUnit) {
       {2048, "MiB", "2.0 GiB"},
       {1, "bytes", "1 byte"},
       {12.5, "milliseconds", "12.5 ms"},
+      {119, "seconds", "119 s"},
       {7199, "seconds", "120 min"},
+      {7200, "seconds", "2 h"},
       {36, "hours", "36 h"},
       {60, "hours", "2.5 days"},
       {41250, "thousandths of a degree Celsius", "41.3 °C"},
@@ -133,15 +135,28 @@ TEST(BarChartsTest, ShowWhatIsNotNothing) {
   EXPECT_EQ(attributes(histogram, "aria-label"),
             "H: 1\u202F000\u202F001 values, most in (2, 3]: 1\u202F000\u202F000\n");
   HtmlWriter bars;
-  const Bar kBars[] = {{"a", 5, "5"}, {"b", -1, "-1"}, {"c", kNan, "?"}};
+  const Bar kBars[] = {{"a.b", 0.5, "5"}, {"b", -1, "-1"}, {"c", kNan, "?"}, {"d", 0.25, ""}};
   writeBars(bars, "B", kBars);
-  EXPECT_EQ(attributes(bars, "width"), "1000\n0\n0\n");
+  EXPECT_EQ(attributes(bars, "width"), "1000\n0\n0\n500\n");
+  EXPECT_EQ(attributes(bars, "aria-label"), "B\na.b: 5\nb: -1\nc: ?\nd: \n");
+  EXPECT_EQ(
+      bars.written().find("<ul class=\"bars\" aria-label=\"B\"><li><span><bdi>a.<wbr>b</bdi>"), 0U);
   HtmlWriter shares;
-  const Share kShares[] = {{"on", 0.25, "1 s"}, {"no", kNan, ""}, {"off", 0.75, ""}, {"x", 9, ""}};
-  writeShares(shares, "S", kShares);
+  std::vector<Share> parts = {
+      {"on", 0.25, "1 s"}, {"no", kNan, ""}, {"off", 0.75, ""}, {"x", 9, ""}};
+  writeShares(shares, "S", parts);
   EXPECT_EQ(attributes(shares, "x") + attributes(shares, "width"), "0\n250\n250\n750\n");
   EXPECT_EQ(attributes(shares, "style"),
             "opacity:1.00\nopacity:0.75\nopacity:0.50\nopacity:0.25\n");
+  EXPECT_NE(shares.written().find("<bdi>on</bdi></span><b>25.0 %</b><small>1 s</small></li><li>"),
+            std::string_view::npos);
+  parts = std::vector<Share>(10, {"t", 1e-9, ""});
+  HtmlWriter tiny;
+  writeShares(tiny, "T", parts);
+  EXPECT_EQ(
+      attributes(tiny, "aria-label"),
+      "T: t 0.0 %, t 0.0 %, t 0.0 %, t 0.0 %, t 0.0 %, t 0.0 %, t 0.0 %, t 0.0 % and 2 more\n");
+  EXPECT_EQ(attributes(tiny, "width"), "");
 }
 
 TEST(IntervalChartTest, HasOneScale) {
