@@ -1,16 +1,46 @@
 // tavrel-health: reads the health of all drives once, with only the rights that this needs.
 #include <cstdio>
 #include <exception>
+#include <string>
+#include <string_view>
 
 #include "base/arithmetic.h"
+#include "base/version.h"
 #include "platform/linux/health/reader.h"
 #include "platform/linux/process/linux_clock.h"
 #include "platform/linux/system_log/linux_system_log.h"
 
+namespace tavrel {
+namespace {
+
+constexpr const char* kHelp =
+    "Usage: tavrel-health [--help | --version]\n"
+    "Reads the health of all drives once and leaves the readings in /run/tavrel/health/.\n"
+    "\n"
+    "\"tavrelctl disks\" shows the readings. See tavrel-health(8).\n";
+
+// The exit status. With any other argument no drive is touched.
+int answer(std::string_view argument) {
+  if (argument == "--help" || argument == "-h") {
+    std::fputs(kHelp, stdout);
+  } else if (argument == "--version") {
+    std::printf("tavrel-health %s\n", std::string(version()).c_str());
+  } else {
+    std::fprintf(stderr, "tavrel-health: unexpected argument '%s': see --help\n",
+                 std::string(argument).c_str());
+    return 2;
+  }
+  return 0;
+}
+
+}  // namespace
+}  // namespace tavrel
+
 // Exits with 1 when a reading or the memory could not be written. For a drive that cannot be
 // read, the reading says so.
-int main() try {
+int main(int argc, char** argv) try {
   using namespace tavrel;
+  if (argc > 1) return answer(argv[1]);
   LinuxSystemLog log;
   try {
     const DeviceRoot root = DeviceRoot::fromEnvironment();

@@ -241,16 +241,18 @@ TEST(DaemonTest, RefusesADeviceThatIsNotThere) {
 TEST(HealthProgramTest, SaysWhatItCannotRead) {
   const TemporaryRoot device;
   const std::string errors = device.root.path("/errors");
-  const auto run = [&](const std::string& root, int status) {
+  const auto run = [&](const std::string& root, int status, const char* argument = nullptr) {
     const auto program = [&] {
       ::setenv("TAVREL_ROOT", root.c_str(), 1);
-      ::execl(TAVREL_HEALTH_BINARY, "tavrel-health", nullptr);
+      ::execl(TAVREL_HEALTH_BINARY, "tavrel-health", argument, nullptr);
       ::_exit(127);
     };
     EXPECT_EQ(waitFor(forkProcess(program, errors)), status);
     return loggedIn(errors);
   };
   const std::string none = device.root.path("/none");
+  EXPECT_EQ(run(none, 0, "--version"), "");
+  EXPECT_EQ(run(none, 2, "nvme0"), "unexpected argument 'nvme0': see --help\n");
   EXPECT_EQ(run(none, 1), "error cannot use device root " + none +
                               "/: No such file or directory: name the device's folder with "
                               "TAVREL_ROOT\n");
