@@ -262,6 +262,10 @@ TEST(HealthProgramTest, SaysWhatItCannotRead) {
   EXPECT_EQ(run(device.root.path("/"), 0), "error cannot use remembered counters " + memory +
                                                ", starting again: cannot use " + memory +
                                                ": it is a folder; move it away\n");
+  std::filesystem::remove(memory);
+  device.write("/run/tavrel/health", "");
+  const std::string readings = device.root.path("/run/tavrel/health");
+  EXPECT_EQ(run(device.root.path("/"), 1), "error cannot list " + readings + ": Not a directory\n");
 }
 
 TEST(DaemonTest, RunsWithoutSomebodyToListenToIt) {
