@@ -42,6 +42,7 @@ TEST(CatalogueTest, FindsRows) {
   const std::pair<std::string, std::string> statistics[] = {
       {"com.norvane.usage.processe", "none"},
       {"com.norvane.usage.processes2", "none"},
+      {"com.norvane.usage.processes#", "none"},
       {"", "none"},
       {"#2", "none"},
       {"zzz", "none"},
@@ -74,7 +75,7 @@ TEST(CatalogueTest, FindsRows) {
   for (const auto& [driver, group, name, row] : channels)
     EXPECT_EQ(keyOf(catalogue::findChannel(driver, group, name)), row) << name;
 
-  EXPECT_EQ(keyOf(catalogue::findController("ECBins99")), "ECBins<n>");
+  EXPECT_EQ(keyOf(catalogue::findController("ECBins10")), "ECBins<n>");
   EXPECT_EQ(keyOf(catalogue::findController("ECBins")), "ECBins<n>");
   EXPECT_EQ(keyOf(catalogue::findController("boots1")), "none");
 }
