@@ -14,8 +14,10 @@ namespace {
 double logGammaStep(double x) {
   constexpr double kLarge = 20;
   double product = 1;
-  for (; x < kLarge; x += 1)
+  while (x < kLarge) {
     product *= x / (x + 0.5);
+    x += 1;
+  }
   const double y = 1 / (x * x);
   const double series = -(1.0 / 8 - y * (1.0 / 192 - y * (1.0 / 640 - y * (17.0 / 14336)))) / x;
   return 0.5 * std::log(x) + series + std::log(product);
@@ -75,8 +77,10 @@ double studentQuantile(double probability, double degreesOfFreedom) {
     low = high;
     high *= 2;
   }
-  for (double middle = (low + high) / 2; low < middle && middle < high; middle = (low + high) / 2) {
+  double middle = (low + high) / 2;
+  while (low < middle && middle < high) {
     (studentTwoSided(middle, degreesOfFreedom) > probability ? low : high) = middle;
+    middle = (low + high) / 2;
   }
   return high;
 }
