@@ -256,6 +256,7 @@ class Comparer {
 
 void correctAndSort(std::vector<Comparison>& comparisons) {
   std::vector<double> pValues;
+  pValues.reserve(comparisons.size());
   for (const Comparison& one : comparisons)
     pValues.push_back(one.pValue);
   const std::vector<double> adjusted = holm(pValues);
