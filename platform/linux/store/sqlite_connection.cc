@@ -150,8 +150,6 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
       flags |= SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE;
       break;
     case Access::WriteAlone:
-      flags |= SQLITE_OPEN_READWRITE;
-      break;
     case Access::Read:
     case Access::ReadAlone:
       // Ask for writing too: only a user who may write can use a log that has no index. SQLite
