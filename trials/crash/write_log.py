@@ -66,7 +66,7 @@ class Image:
 
     def __init__(self, log, size, chunk=65536):
         self.log, self.chunk = log, chunk
-        self.bytes = bytearray(size)
+        self.bytes = mmap.mmap(-1, size)  # takes memory only for what is written
         self.used = set()  # chunks that may hold something
         self.position = 0
         self.undo = []
