@@ -1,4 +1,4 @@
-// For work whose failure must not stop what follows, for example in destructors.
+// For work whose failure must not stop what follows, for example in destructors, or ends a program.
 #pragma once
 
 #include <exception>
@@ -20,6 +20,18 @@ void runGuarded(SystemLog& log, const char* what, Action action) noexcept {
   } catch (...) {
     // There was no memory even for the log line.
   }
+}
+
+/// The exit status that `body` returns; 1 when it throws, which is logged as "WHAT ended early:
+/// reason".
+template <class Body>
+int loggedStatusOf(SystemLog& log, const char* what, Body body) {
+  try {
+    return body();
+  } catch (const std::exception& failure) {
+    log.log(LogLevel::Error, "%s ended early: %s", what, failure.what());
+  }
+  return 1;
 }
 
 }  // namespace tavrel

@@ -1,6 +1,5 @@
 // tavrel-statsd: records what programs send as StatsD datagrams.
 #include <cstdio>
-#include <exception>
 #include <getopt.h>
 #include <string>
 #include <string_view>
@@ -8,6 +7,7 @@
 
 #include "base/format.h"
 #include "base/parse_number.h"
+#include "base/program.h"
 #include "base/version.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
@@ -41,7 +41,7 @@ void complain(std::string_view message) {
   std::fprintf(stderr, "tavrel-statsd: %s\n", std::string(message).c_str());
 }
 
-// An exit status when the program must not run.
+// An exit status when the program is not to run.
 std::optional<int> parseOptions(int argc, char** argv, Options& options) {
   enum : int { kUdp = 256, kUnix, kPrefix, kIdle, kShowHelp, kVersion };
   constexpr option kOptions[] = {{"udp", required_argument, nullptr, kUdp},
@@ -123,7 +123,7 @@ int run(int argc, char** argv) {
     return 1;
   }
   StatsdRecorder recorder(options.prefix);
-  // If recording fails, take datagrams anyway: the library retries while the program runs.
+  // Datagrams are taken anyway: the library tries again while the program runs.
   const char* why = nullptr;
   if (BHClientGetStatus(&why) != BHClientStatusRecording) complain(why);
 
@@ -141,10 +141,6 @@ int run(int argc, char** argv) {
 }  // namespace
 }  // namespace tavrel
 
-int main(int argc, char** argv) try {
-  return tavrel::run(argc, argv);
-} catch (const std::exception&) {
-  // All other failures are returned; only memory can run out.
-  std::fputs("tavrel-statsd: out of memory\n", stderr);
-  return 1;
+int main(int argc, char** argv) {
+  return tavrel::exitStatusOf("tavrel-statsd", [&] { return tavrel::run(argc, argv); });
 }

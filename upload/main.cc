@@ -1,11 +1,12 @@
 // tavrel-upload: sends waiting logs to a server, once.
 #include <cstdio>
 #include <cstdlib>
-#include <exception>
 #include <getopt.h>
 #include <string>
 
+#include "base/program.h"
 #include "base/version.h"
+#include "platform/guarded.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/linux/process/linux_clock.h"
 #include "platform/linux/system_log/linux_system_log.h"
@@ -15,7 +16,7 @@
 namespace tavrel::upload {
 namespace {
 
-// For scripts and units; listed in tavrel-upload(8). The last two are those of sysexits.h.
+// For scripts and units; tavrel-upload(8) lists them. The last two are those of sysexits.h.
 enum ExitStatus : int { kDone = 0, kFailed = 1, kMisused = 2, kWaits = 75, kMisconfigured = 78 };
 
 constexpr const char* kHelp =
@@ -88,21 +89,12 @@ int run(int argc, char** argv) {
     return kMisused;
   }
   LinuxSystemLog log;
-  try {
-    return upload(log, atOnce);
-  } catch (const std::exception& error) {
-    log.log(LogLevel::Error, "upload ended early: %s", error.what());
-  }
-  return kFailed;
+  return loggedStatusOf(log, "upload", [&] { return upload(log, atOnce); });
 }
 
 }  // namespace
 }  // namespace tavrel::upload
 
-int main(int argc, char** argv) try {
-  return tavrel::upload::run(argc, argv);
-} catch (const std::exception&) {
-  // A formatted message would take memory, and none is left.
-  std::fputs("tavrel-upload: out of memory\n", stderr);
-  return 1;
+int main(int argc, char** argv) {
+  return tavrel::exitStatusOf("tavrel-upload", [&] { return tavrel::upload::run(argc, argv); });
 }

@@ -5,7 +5,9 @@
 #include <sys/un.h>
 #include <sys/utsname.h>
 
+#include "base/program.h"
 #include "device_services.h"
+#include "platform/guarded.h"
 #include "platform/linux/device/file_device_answers.h"
 #include "platform/linux/device/linux_system_version.h"
 #include "platform/linux/files/digests.h"
@@ -27,6 +29,14 @@ struct Services : DeviceServices {
 };
 
 struct ServicesTest : testing::Test, Services {};
+
+TEST_F(ServicesTest, ProgramsThatRunOutOfMemorySaySo) {
+  const auto runsOut = []() -> int { throw std::bad_alloc(); };
+  EXPECT_EXIT(std::exit(exitStatusOf("name", runsOut)), testing::ExitedWithCode(1),
+              "^name: out of memory\n$");
+  EXPECT_EQ(loggedStatusOf(log, "work", runsOut), 1);
+  EXPECT_EQ(log.lines, (Lines{"work ended early: std::bad_alloc"}));
+}
 
 TEST_F(ServicesTest, DeviceAnswersComeFromTheFileAndTheFileSystem) {
   struct statvfs status {};
