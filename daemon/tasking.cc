@@ -169,10 +169,16 @@ class Tracker {
     forEachSetting(payload,
                    [&](const plist::Dictionary& setting, std::string_view domain,
                        std::string_view key) { writer.set(domain, key, setting.get("Value")); });
-    writer.set(kTavrelDomain, kTaskingIDKey, scheduled.get(kTaskingIDKey));
-    writer.set(kTavrelDomain, kTaskingOSKey, build_);
-    writer.set(kTavrelDomain, kTaskingDigestKey, scheduled.get(kTaskingDigestKey));
-    writer.set(kTavrelDomain, kTaskingPayloadKey, payload);
+    try {
+      writer.set(kTavrelDomain, kTaskingIDKey, scheduled.get(kTaskingIDKey));
+      writer.set(kTavrelDomain, kTaskingOSKey, build_);
+      writer.set(kTavrelDomain, kTaskingDigestKey, scheduled.get(kTaskingDigestKey));
+      writer.set(kTavrelDomain, kTaskingPayloadKey, payload);
+    } catch (...) {
+      // Remembered by half, the tasking would be neither applied once more nor ever undone.
+      writer.remove(kTavrelDomain, kTaskingIDKey);
+      throw;
+    }
   }
 
   Platform& platform_;

@@ -46,6 +46,20 @@ TEST_F(TaskingTest, NotesAnOSUpdate) {
   EXPECT_EQ(track(), Journal{});
 }
 
+TEST_F(TaskingTest, AppliesOnceMoreWhatFoundNoMemory) {
+  const Array payload{setting("b", "k", 1)};
+  schedule({{"TaskingID", "one"}, {"TaskingDigest", 7}, {"TaskingPayload", payload}});
+  for (const char* const key : {"TaskingOS", "TaskingDigest", "TaskingPayload"}) {
+    fake.preferences.keyWithoutMemory = key;
+    EXPECT_THROW(track(), std::bad_alloc) << key;
+    EXPECT_EQ(nextTaskingChange(fake.platform), TaskingChange::Apply) << key;
+  }
+  fake.preferences.keyWithoutMemory = "none";
+  track();
+  EXPECT_EQ(own.get("TaskingPayload"), plist::Value(payload));
+  EXPECT_EQ(nextTaskingChange(fake.platform), TaskingChange::None);
+}
+
 TEST_F(TaskingTest, AppliesUndoesAndAppliesAgain) {
   own = {{"LastOSUpdate", Dictionary{{"version", "21A5"}, {"day", 1}}}};
   const Array payload{setting("b", "k", 1), setting("a", "k", "x"), setting("b", "l", true),

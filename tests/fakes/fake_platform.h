@@ -6,6 +6,7 @@
 #include <deque>
 #include <exception>
 #include <map>
+#include <new>
 #include <optional>
 #include <set>
 #include <string>
@@ -52,6 +53,7 @@ struct FakePreferences : Preferences {
   explicit FakePreferences(Journal& journalOfCalls) : journal(journalOfCalls) {}
   Journal& journal;
   std::map<std::string, plist::Dictionary, std::less<>> domains;
+  std::string keyWithoutMemory = "none";
 
   plist::Dictionary& domain(std::string_view name) {
     return domains.try_emplace(std::string(name), plist::Dictionary::create()).first->second;
@@ -61,6 +63,7 @@ struct FakePreferences : Preferences {
   }
   void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                               std::string_view name) override {
+    if (key == keyWithoutMemory) throw std::bad_alloc();
     journal.push_back(format("%s %s %s", value ? "set" : "remove", name, key));
     domain(name).set(key, plist::deepCopy(value));
   }

@@ -158,7 +158,8 @@ def after_service(device, reference, done):
     after_daily(device, reference, done)
     if taskings(device) == wanted(taskings, reference):
         return
-    if not errors_of(done):
+    # Without the OS build, which could not be read, the next run applies the tasking once more.
+    if not errors_of(done) and tool(device, "prefs", "get", "com.example", "k1").strip() != "1":
         raise Broken(f"the tasking is not applied, and nobody says why: {taskings(device)}")
     next_daily_run(device, "-f")
     if taskings(device) != wanted(taskings, reference):
