@@ -42,7 +42,8 @@ class Statsd : public Recording {
 };
 
 TEST_F(Statsd, RecordsWhatLinesSay) {
-  run([] {
+  const std::string kLongestName(1022, 'n');
+  run([&] {
     StatsdRecorder recorder("s.");
     recorder.take("hits:1|c\nhits:2|c|@0.1\n\nhits:1:2|c|#tag\n");
     for (int i = 0; i < 3; ++i)
@@ -57,11 +58,12 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
       many += ":7";
     recorder.take(many + "|ms|@0.001");
     recorder.take("time:9|c");  // a scalar may have the same name as a series
-    recorder.take("bad\nset:1|s\n" + std::string(1023, 'n') + ":1|c");
+    recorder.take("b\nset:1|s\n" + std::string(1023, 'n') + ":1|c\n" + kLongestName + ":1|c");
     recorder.count(StatsdFault::TooLong);
   });
   fold();
   const Scalars expected{{{"s.hits", kToday}, 24},
+                         {{"s." + kLongestName, kToday}, 1},
                          {{"s.thirds", kToday}, 10},
                          {{"s.tenths", kToday}, 1},
                          {{"s.level", kToday}, 6},
@@ -107,6 +109,7 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   sockaddr_in address{};
   socklen_t size = sizeof address;
   getsockname(loopback->descriptor(), reinterpret_cast<sockaddr*>(&address), &size);
+  EXPECT_EQ(ntohl(address.sin_addr.s_addr), INADDR_LOOPBACK) << "no other machine may send";
   const std::uint16_t port = ntohs(address.sin_port);
   EXPECT_EQ(openLoopbackSocket(port).error().message,
             "cannot listen on UDP port " + std::to_string(port) + kInUse);
@@ -153,8 +156,11 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
   EXPECT_EQ(scalars.begin()->first.first, "own");
 
   const std::string taken = "cannot listen on " + path + kInUse + "\n";
+  const std::string file = root / "file";
+  std::ofstream(file) << "kept";
   const std::tuple<std::string, int, std::string> cases[] = {
       {"--unix " + path, 1, taken},
+      {"--unix " + file, 1, "cannot listen on " + file + kInUse + "\n"},
       {"--unix /x/" + std::string(106, 'x'), 1,
        "cannot listen on /x/" + std::string(106, 'x') + ": give a path of at most 107 bytes\n"},
       {"--unix /dev/null/x", 1, "cannot listen on /dev/null/x: Not a directory\n"},
@@ -163,9 +169,10 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
       {"--prefix 'a b'", 2,
        "not a prefix: a b: give letters, digits, '.', '_' and '-', at most 200\n"},
       {"--idle 86401", 2, "not a time: 86401: give 0 to 86400 seconds\n"},
-      {"x", 2, "unexpected argument 'x': see --help\n"}};
+      {"--idle 86400 --udp 65535 x", 2, "unexpected argument 'x': see --help\n"}};
   for (const auto& [options, status, message] : cases)
     EXPECT_EQ(outputOf(kProgram + " " + options, status), "tavrel-statsd: " + message);
+  EXPECT_TRUE(std::filesystem::is_regular_file(file));
   EXPECT_EQ(
       outputOf("exec 3</dev/null; LISTEN_FDS=1 exec sh -c 'LISTEN_PID=$$ exec " + kProgram + "'",
                1),
@@ -175,7 +182,11 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
   EXPECT_EQ(waitFor(child), SIGTERM);
 }
 
-TEST(StatsdSockets, SayWhenNoDescriptorIsLeft) {
+TEST(StatsdSockets, SayWhatTheyCannotDo) {
+  std::vector<DatagramSocket> others;
+  others.emplace_back(open("/dev/null", O_RDONLY | O_CLOEXEC));
+  EXPECT_EQ(receiveDatagrams(others, std::nullopt, {}).error().message,
+            "cannot receive datagrams: Socket operation on non-socket");
   rlimit before{};
   ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
   const rlimit none{.rlim_cur = 0, .rlim_max = before.rlim_max};
