@@ -106,10 +106,11 @@ std::string rowsOf(fleet::Server& server, unsigned table, std::string answer) {
     switch (table % 5) {
       case 0:
         reading.logs(0, 1, [&](std::span<const fleet::LogRow> rows) {
-          for (const fleet::LogRow& row : rows)
+          for (const fleet::LogRow& row : rows) {
             add(row.log, row.day, row.created, row.osVersion, row.previousOsVersion,
                 row.configNumber, row.whitelistDigest, row.taskID, row.language,
                 row.preferredLanguage, row.region);
+          }
         });
         break;
       case 1:
@@ -124,9 +125,10 @@ std::string rowsOf(fleet::Server& server, unsigned table, std::string answer) {
         break;
       case 3:
         reading.distributions("a", [&](std::span<const fleet::DistributionValue> rows) {
-          for (const fleet::DistributionValue& row : rows)
+          for (const fleet::DistributionValue& row : rows) {
             add(row.log, row.numbers.minimum, row.numbers.maximum, row.numbers.mean,
                 row.numbers.squaredDeviations, row.numbers.count);
+          }
         });
         break;
       default:

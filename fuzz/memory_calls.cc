@@ -1,5 +1,6 @@
 // Interposes the C library's functions for files: calls that concern memory_files.h go there, all
 // others to the kernel or the library. Readers, libstdc++, libarchive and zlib all use these.
+#include <bit>
 #include <cerrno>
 #include <cstdarg>
 #include <cstdlib>
@@ -247,8 +248,9 @@ int fstat(int descriptor, struct stat* status) noexcept {
 void* mmap(void* wanted, std::size_t size, int protection, int flags, int descriptor,
            off_t at) noexcept {
   if (!MemoryFiles::isDescriptor(descriptor)) {
-    return reinterpret_cast<void*>(
-        syscall(SYS_mmap, wanted, size, protection, flags, descriptor, at));
+    // The call's result as a pointer: the library's function cannot be asked in its own place.
+    const long place = syscall(SYS_mmap, wanted, size, protection, flags, descriptor, at);
+    return std::bit_cast<void*>(place);
   }
   const std::lock_guard lock(MemoryFiles::all().mutex);
   MemoryHandle* const handle = MemoryFiles::all().handle(descriptor);
@@ -302,7 +304,9 @@ char* realpath(const char* path, char* room) noexcept {
   if (!isOurs(path)) return libraryFunction(&realpath, "realpath")(path, room);
   const std::lock_guard lock(MemoryFiles::all().mutex);
   if (!MemoryFiles::all().find(path)) return nullptr;
-  return room ? std::strcpy(room, path) : strdup(path);
+  if (!room) return strdup(path);
+  std::memcpy(room, path, std::strlen(path) + 1);  // PATH_MAX bytes, as of the call
+  return room;
 }
 int mkdir(const char* path, mode_t mode) noexcept {
   return onPath(

@@ -9,6 +9,7 @@
 #include "memory_tree.h"
 #include "platform/linux/logs/log_day.h"
 #include "platform/plist/coding.h"
+#include "platform/plist/encodable_text.h"
 #include "storage/parse/asp_parser.h"
 #include "support.h"
 #include "tools/log/log_document.h"
@@ -42,7 +43,7 @@ void readJson(std::string_view text) {
 void readArgument(std::string_view text, unsigned kind) {
   const auto value = parseArgument(text, static_cast<ArgumentKind>(kind % 5));
   if (!value) return require(!value.error().message.empty());
-  if (isXmlText(text)) requireSameFromJson(*value);
+  if (plist::isEncodable(text, plist::Alphabet::Xml)) requireSameFromJson(*value);
 }
 
 void readRecords(std::string_view text, std::size_t first) {
