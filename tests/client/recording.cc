@@ -108,7 +108,7 @@ void Recording::fold() {
     }
     if (isGone && progress.isComplete) {
       std::filesystem::remove(path);
-    } else if (!isGone) {
+    } else if (!isGone && *state == SegmentReader::State::Begun) {
       const Descriptor writable(open(path.c_str(), O_WRONLY));
       if (!writable && errno == ENOENT) continue;
       ASSERT_TRUE(acknowledge(writable.get(), progress));
