@@ -72,7 +72,6 @@ class Image:
         self.undo = []
 
     def put(self, start, content):
-        self.undo.append((start, bytes(self.bytes[start:start + len(content)])))
         self.bytes[start:start + len(content)] = content
         if content.strip(b"\0"):
             self.used.update(range(start // self.chunk, -(-(start + len(content)) // self.chunk)))
@@ -84,7 +83,11 @@ class Image:
             if entry.length:
                 self.put(entry.start, self.log.content(entry))
             self.position += 1
-        self.undo = []
+
+    def overwrite(self, start, content):
+        """As `put`, until `mend`."""
+        self.undo.append((start, self.bytes[start:start + len(content)]))
+        self.put(start, content)
 
     def tear(self, pieces, atom):
         """Writes parts of entries, as `torn` chose them; `mend` undoes that."""
@@ -92,9 +95,9 @@ class Image:
             entry = self.log.entries[number]
             content = self.log.content(entry)
             if kept is None:
-                self.put(entry.start, content)
+                self.overwrite(entry.start, content)
             for piece in kept or ():
-                self.put(entry.start + piece, content[piece:piece + atom])
+                self.overwrite(entry.start + piece, content[piece:piece + atom])
 
     def mend(self):
         for start, content in reversed(self.undo):
