@@ -97,7 +97,7 @@ class Judge:
         pieces = () if state.cut is None else torn(
             self.log, state.position, state.cut,
             random.Random(f"{self.options.seed} {state.number} torn"), self.kind.atom)
-        # The pieces of a thousand states would take more memory than user-mode Linux can map.
+        # A digest, because the pieces of a state take megabytes.
         device = *where, state.position, hashlib.sha256(repr(pieces).encode()).digest()
         if device not in self.devices:
             fault, lost = self.verdict(state, *where, pieces), False
