@@ -67,8 +67,9 @@ TEST_F(LinuxEventLoopTest, SourcesMayEndThemselvesAndOthers) {
     calls += kept == std::string(99, 'x') ? 1 : 0;
     return Activity::Event;
   });
-  others = *loop.watch(other.reader.get(), [&calls] {
-    calls += 100;
+  const auto held = std::make_shared<int>(100);
+  others = *loop.watch(other.reader.get(), [&calls, held] {
+    calls += *held;
     return Activity::Event;
   });
   pipe.put();
@@ -76,6 +77,7 @@ TEST_F(LinuxEventLoopTest, SourcesMayEndThemselvesAndOthers) {
   other.put();
   EXPECT_EQ(loop.runSlice(0ms), Slice::TimedOut);
   EXPECT_EQ(calls, 1);
+  EXPECT_EQ(held.use_count(), 1) << "a stopped source keeps its callback";
 }
 
 TEST(LinuxEventLoop, SignalsEndTheWaitBetweenEvents) {

@@ -199,5 +199,16 @@ It would file no log: the run for day YESTERDAY (DATE) is already done
 )");
 }
 
+TEST(Rehearse, CountsTheLogsThatAWithdrawalLeftBehind) {
+  const Rehearsed device;
+  const std::string pending = "/var/mobile/Library/Logs/Submission/pending/log-tallied-2026-11-2";
+  for (const char* name : {"4-1.log", "5-1.log"})
+    device.write(pending + name, "");
+  const std::string line = "\n  would remove logs that wait without permission: 2\n";
+  EXPECT_EQ(device.text(" --today").find(line), std::string::npos);
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled false --bool");
+  EXPECT_NE(device.text(" --today").find(line), std::string::npos);
+}
+
 }  // namespace
 }  // namespace tavrel
