@@ -4,6 +4,7 @@
 #include <gmock/gmock.h>
 #include <nlohmann/json.hpp>
 #include <random>
+#include <regex>
 #include <sstream>
 
 #include "fleet/fleet_tool.h"
@@ -168,6 +169,8 @@ TEST_F(QuestionCommands, TellWhatChanged) {
 
   const std::string page = run(file, {"page", "-o", "-"}).out;
   EXPECT_THAT(page, HasSubstr("2 of 4 statistics changed"));
+  const std::regex sentence("Chance alone would show");
+  EXPECT_EQ(std::distance(std::sregex_iterator(page.begin(), page.end(), sentence), {}), 2);
   EXPECT_THAT(page, HasSubstr("Endurance used"));
   EXPECT_EQ(page.find("<script"), std::string::npos);
 }

@@ -135,6 +135,9 @@ class Years(Mishaps):
             print("| " + " | ".join(columns) + " |\n" + "|---" * len(columns) + "|")
         print("| " + " | ".join(map(str, columns.values())) + " |", flush=True)
         for name, most in MOST.items():
+            # While the clock is wrong, ended programs' segments keep values that wait for a date.
+            if name == "run KiB" and self.repair_clock_at is not None:
+                continue
             expect(figures[name] <= most, f"{figures[name]} {name} are more than {most}")
         _, first_memory, first_descriptors = self.figures[0]
         expect(descriptors == first_descriptors, f"descriptors: {first_descriptors}, {descriptors}")
