@@ -97,6 +97,7 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
   device.check("tasking show",
                prints("Scheduled tasking: none\nApplied tasking: none\nLast OS update: none seen\n"
                       "The next daily run changes nothing.\n"));
+  EXPECT_EQ(device.json("tasking show")["applied"], nullptr);
   device.check("tasking clear", prints("No tasking is scheduled.\n"));
 
   EXPECT_EQ(device.run("tasking schedule -",

@@ -15,6 +15,11 @@ std::int32_t today() {
                                    kSecondsPerDay);
 }
 
+std::ptrdiff_t countOf(const std::string& text, const std::string& expression) {
+  const std::regex pattern(expression);
+  return std::distance(std::sregex_iterator(text.begin(), text.end(), pattern), {});
+}
+
 struct PageTest : testing::Test {
   const TemporaryDevice device;
 
@@ -26,6 +31,9 @@ struct PageTest : testing::Test {
   std::string textOf(const std::string& options = {}, int status = 0) const {
     const Outcome outcome = device.run("page -o - " + options);
     EXPECT_EQ(outcome.status, status) << outcome.error;
+    for (const char* element : {"table", "section", "svg"})
+      EXPECT_EQ(countOf(outcome.out, std::string("<") + element + "[ >]"),
+                countOf(outcome.out, std::string("</") + element + ">"));
     const std::string body = outcome.out.substr(outcome.out.find("</head>") + 7);
     return std::regex_replace(std::regex_replace(body, std::regex("<wbr>"), ""),
                               std::regex("(<[^>]*>|\\s)+"), " ");
