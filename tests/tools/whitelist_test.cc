@@ -142,7 +142,7 @@ TEST(WhitelistDiff, SaysWhatChangesForWhatLeaves) {
                          "same": {"bucket_interval": 1}, "gone": {}, "moved": {"sig_fig": 2},
                          "all": {"sig_fig": 19}, "nothing": {"sig_fig": 4294967295}},
           "ScalarKeyPrefixes": {"p.": {"sig_fig": 2}, "p.q.": {"sig_fig": 1}},
-          "DistributionKeys": {"more": {"intervals": [1, 3]}, "less": {"intervals": [1, 2, 0]},
+          "DistributionKeys": {"more": {"intervals": [1, 3]}, "less": {"intervals": ["x", 1, 2, 0]},
                                "empty": {"intervals": []}}},
     "InternalTesting": {"ScalarKeys": {"secret": {}}}})"));
   device.write("/new.plist", xmlOf(R"({
@@ -166,7 +166,7 @@ gets finer (5)
 gets coarser (3)
   scalar coarser: reported unchanged -> bucket_interval 2
   scalar gone: reported unchanged -> sig_fig 2
-  distribution less: summary and histogram, intervals [1, 2, 0] -> summary and histogram, intervals [2]
+  distribution less: summary and histogram, intervals ["x", 1, 2, 0] -> summary and histogram, intervals [2]
 )";
   device.check({"whitelist", "diff", before, after}, (Outcome{1, expected, ""}));
   device.check({"whitelist", "diff", before, before}, prints("no change in what leaves\n"));
