@@ -92,6 +92,9 @@ ReadsBeforeErasure
   EXPECT_EQ(old.status, 0) << old;
   EXPECT_EQ(old.out.find("amplification"), std::string::npos) << old;
   EXPECT_EQ(device.json("nand info").size(), 17U);
+
+  record(device, built(device, R"([["exportVersion", 131075], ["numVirtualBlocks", 8]])"));
+  EXPECT_EQ(device.json("nand info")["derived"]["free_virtual_blocks_share"], 0);
 }
 
 TEST(NandInfo, AFailureIsNoZero) {
