@@ -7,7 +7,7 @@
 namespace tavrel {
 
 /// The exit status that `body` returns; 1, and the line "NAME: out of memory", when it throws. All
-/// other failures have been said by then, and a longer line could take memory.
+/// other failures have been reported by then, and a longer line could take memory.
 template <class Body>
 int exitStatusOf(const char* name, Body body) noexcept {
   try {

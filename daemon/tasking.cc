@@ -175,7 +175,7 @@ class Tracker {
       writer.set(kTavrelDomain, kTaskingDigestKey, scheduled.get(kTaskingDigestKey));
       writer.set(kTavrelDomain, kTaskingPayloadKey, payload);
     } catch (...) {
-      // Remembered by half, the tasking would be neither applied once more nor ever undone.
+      // Half remembered, the tasking would be neither applied again nor undone.
       writer.remove(kTavrelDomain, kTaskingIDKey);
       throw;
     }

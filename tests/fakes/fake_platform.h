@@ -307,7 +307,7 @@ struct FakeStreams : StandardStreams {
   void writeError(std::string_view text) override { error += text; }
 };
 
-/// No drivers, or those of the registry behind it.
+/// No drivers, or those of the registry `behind`.
 struct FakeRegistry : DriverRegistry {
   DriverRegistry* behind = nullptr;
 

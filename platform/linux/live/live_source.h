@@ -73,7 +73,7 @@ class TextReader {
 /// How a file may be read.
 enum class Speed : std::uint8_t {
   Quick,
-  Slow,  // the device behind it may be slow: read last, and only for a bounded time
+  Slow,  // the device may be slow to answer: read last, and only for a bounded time
 };
 
 struct LiveFile {
