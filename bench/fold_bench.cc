@@ -8,7 +8,6 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include "brimhold/client.h"
 #include "platform/distribution_values.h"
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
@@ -22,10 +21,6 @@ constexpr int kProcesses = 5;
 constexpr int kKeys = 1000;
 constexpr int kPerProcess = 200'000;
 
-std::string keyNumber(int number) {
-  return "com.example.measurement." + std::to_string(number);
-}
-
 /// Segments and the store, both in memory to exclude the disk.
 class Device {
  public:
@@ -38,17 +33,17 @@ class Device {
   Device(const Device&) = delete;
   Device& operator=(const Device&) = delete;
 
+  /// By other programs: libbrimhold of this one may have begun in another root.
   void record() const {
+    const std::string recorder =
+        std::filesystem::read_symlink("/proc/self/exe").parent_path() / "tavrel_record_values";
     for (int process = 0; process < kProcesses; ++process) {
       const pid_t child = fork();
       if (child == 0) {
         setenv("TAVREL_ROOT", root.c_str(), 1);
-        BHClientDistributionKey* keys[kKeys];
-        for (int i = 0; i < kKeys; ++i)
-          keys[i] = BHClientDistributionForKey(keyNumber(i).c_str());
-        for (int i = 0; i < kPerProcess; ++i)
-          BHClientDistributionRecord(keys[i * 7919 % kKeys], i);
-        _exit(0);
+        execl(recorder.c_str(), recorder.c_str(), std::to_string(kKeys).c_str(),
+              std::to_string(kPerProcess).c_str(), nullptr);
+        _exit(1);
       }
       waitpid(child, nullptr, 0);
     }
