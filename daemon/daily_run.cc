@@ -58,9 +58,10 @@ void noteDaysPassedOver(SystemLog& log, std::int64_t lastRunDay, std::int32_t ye
   const std::int64_t sinceRun = wrappingSubtract(yesterday, lastRunDay);
   if (sinceRun <= 1 || sinceRun > kLongestGapDays) return;
   if (sinceRun == 2) {
-    log.log(LogLevel::Info, "1 day had no run and will not be reported: %lld", lastRunDay + 1);
+    log.log(LogLevel::Info, "1 day had no daily run, and has a log only if one was forced: %lld",
+            lastRunDay + 1);
   } else {
-    log.log(LogLevel::Info, "%lld days had no run and will not be reported: %lld to %d",
+    log.log(LogLevel::Info, "%lld days had no daily run, and have logs only if forced: %lld to %d",
             sinceRun - 1, lastRunDay + 1, previousDay(yesterday));
   }
 }
@@ -90,7 +91,7 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
     platform.preferences->ZTXPreferencesSetValue(kLastRunDayKey, yesterday, kTavrelDomain);
   } else {
     platform.log->log(LogLevel::Error,
-                      "the run's statistics could not be saved: the next run repeats day %d",
+                      "the run's statistics could not be saved: another run today repeats day %d",
                       yesterday);
   }
   platform.preferences->ZTXPreferencesSynchronize(kTavrelDomain);

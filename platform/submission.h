@@ -18,6 +18,9 @@ class LogFile {
   virtual void write(ByteSpan bytes) = 0;
 };
 
+/// The type of the daily log, the only one that holds rows of the statistics store.
+inline constexpr std::string_view kTalliedLogType = "193";
+
 class SubmissionService {
  public:
   using LogWriter = std::function<void(LogFile&)>;

@@ -21,7 +21,6 @@
 namespace tavrel {
 
 /// The type and name under which the submission service files the log.
-inline constexpr std::string_view kTalliedLogType = "193";
 inline constexpr std::string_view kTalliedLogName = "log-tallied";
 
 class BHReport {

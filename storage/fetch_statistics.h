@@ -9,9 +9,9 @@
 namespace tavrel {
 
 /// Adds the statistics of the first driver that is present to an empty context. `exporter` receives
-/// its row in any case; the caller must then call the row's `release`, if any, on the context. On
-/// failure a line on standard error says why, unless the driver offers no statistics or they cannot
-/// be parsed.
+/// its row in any case. The row's `release`, if any, empties the context; so does its destruction.
+/// On failure a line on standard error says why, unless the driver offers no statistics or they
+/// cannot be parsed.
 bool fetchStatistics(DriverRegistry& drivers, StandardStreams& streams,
                      const NandExporter*& exporter, ASPContext& context);
 

@@ -80,7 +80,7 @@ TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
   EXPECT_FALSE(storedDay());
   EXPECT_EQ(fake.journal.back(), "synchronize com.norvane.tallied.tavrel");
   EXPECT_EQ(fake.log.messages().back(),
-            "the run's statistics could not be saved: the next run repeats day 19999");
+            "the run's statistics could not be saved: another run today repeats day 19999");
 }
 
 TEST_F(DailyRunTest, TracksOSChangesBetweenTidyingUp) {
@@ -111,9 +111,11 @@ TEST_F(DailyRunTest, CountsTheDaysThatNobodyWillReport) {
   using Case = std::tuple<plist::Value, std::int32_t, std::string>;
   for (const auto& [stored, today, days] :
        {Case({}, 20000, ""), Case("19000", 20000, ""), Case(19998, 20000, ""),
-        Case(19997, 20000, "1 day had no run and will not be reported: 19998"),
-        Case(16339, 20000, "3659 days had no run and will not be reported: 16340 to 19998"),
-        Case(16338, 20000, ""), Case(-3, 2, "3 days had no run and will not be reported: -2 to 0"),
+        Case(19997, 20000, "1 day had no daily run, and has a log only if one was forced: 19998"),
+        Case(16339, 20000,
+             "3659 days had no daily run, and have logs only if forced: 16340 to 19998"),
+        Case(16338, 20000, ""),
+        Case(-3, 2, "3 days had no daily run, and have logs only if forced: -2 to 0"),
         Case(std::int64_t{1} << 40, 20000, ""), Case(INT64_MIN, 20000, ""),
         Case(0, INT32_MIN, "")}) {
     fake.preferences.domain(kTavrelDomain).set(kDayKey, stored);

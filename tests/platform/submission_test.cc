@@ -57,8 +57,9 @@ struct Service : ProcessServices {
     readRowsOf(kToday - 1);
     return writeLog(name, options);
   }
-  bool writeLog(std::string_view name, const plist::Dictionary& options = {}) {
-    return submission.ZTXWriteLogForSubmission("193", name, options, [](LogFile& file) {
+  bool writeLog(std::string_view name, const plist::Dictionary& options = {},
+                std::string_view type = "193") {
+    return submission.ZTXWriteLogForSubmission(type, name, options, [](LogFile& file) {
       file.write(asBytes(std::string_view(kContent).substr(0, 6000)));
       file.write(asBytes(std::string_view(kContent).substr(6000)));
     });
@@ -187,6 +188,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
     std::int32_t day;  // the day of the log's rows
     const char* place;
     bool mayReportYesterday;
+    const char* type = "193";
   } kCases[] = {
       {false, {}, kNoRows, "withheld", false},
       {false, {}, kToday - 1, "submission is not allowed", false},
@@ -198,6 +200,8 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
       {true, kToday, kToday, "pending", false},
       {true, kToday - 1, kToday - 2, "submission is allowed from day 20783 (2026-11-26) on", true},
       {true, kToday, kNoRows, "pending", false},
+      {true, kToday, kToday - 1, "pending", false, "165"},
+      {false, {}, kToday - 1, "withheld", false, "165"},
       {true, kToday + 1, kNoRows, "withheld", false},
       {true, "soon", kToday - 1, "submission is allowed from day 2147483647", false},
       {true, 1.5, kToday - 1, "submission is allowed from day 2147483647", false},
@@ -212,7 +216,7 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
     for (const int later : {0, 1})
       if (given.day != kNoRows) service.readRowsOf(given.day + later);
     const std::string folder = device.root.path(kFolder + given.place);
-    if (!service.writeLog("X")) {
+    if (!service.writeLog("X", {}, given.type)) {
       EXPECT_NE(service.log.lines.back().find(given.place), std::string::npos)
           << service.log.lines.back();
     } else {

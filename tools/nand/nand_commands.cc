@@ -202,12 +202,12 @@ void freezer(ToolContext& context, const Arguments& arguments) {
   if (!arguments.file.empty()) {
     return context.fail(
         format("%s: %s: give a stack snapshot whose first container holds the "
-               "thread VM_swapout",
+               "thread VM_swapout, with complete IO statistics if it has any",
                nameOf(arguments.file), message));
   }
   context.fail(
-      format("no freezer writes: %s: put a stack snapshot that holds the thread "
-             "VM_swapout at %s",
+      format("no freezer writes: %s: put a stack snapshot whose first container holds the "
+             "thread VM_swapout, with complete IO statistics if it has any, at %s",
              message, context.root().path(kRecordedSnapshot)));
 }
 

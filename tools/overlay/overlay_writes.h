@@ -106,7 +106,7 @@ class OverlaySubmission final : public SubmissionService {
     writer(file);
     plist::Dictionary what{{"type", log.type}, {"bytes", std::uint64_t{log.bytes.size()}}};
     if (options) what.set("options", options);
-    const auto place = below_.placeOfNewLog();
+    const auto place = below_.placeOfNewLog(logType);
     if (place && *place == FileSubmission::Place::Withheld) what.set("withheld", true);
     what.set("content", log.bytes);
     events_.tell(OverlayEvent::Kind::Submission, log.name, what);

@@ -98,7 +98,7 @@ system; make the file system writable
 programs recorded waits for the next fold
   STORE: its folder cannot be made: Read-only file system: mount its file system for writing; \
 N values are not kept yet: cannot lock /var/mobile/Library/Brimhold/.lock: No such file or directory
-  the run's statistics could not be saved: the next run repeats day 24799
+  the run's statistics could not be saved: another run today repeats day 24799
   cannot make the folder /var/mobile/Library: Read-only file system; make the file system writable
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: Read-only file \
 system; make the file system writable
@@ -146,7 +146,7 @@ device; free some space
   STORE: database or disk is full: free some space in its file system; N values are not kept yet: \
 cannot write /var/mobile/Library/Brimhold/BHDataStore.sqlitedb-kept: No space left on device; free \
 some space
-  the run's statistics could not be saved: the next run repeats day 24799
+  the run's statistics could not be saved: another run today repeats day 24799
   cannot write /var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist: No space left on \
 device; free some space
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \

@@ -217,8 +217,8 @@ class Model:
         line = None
         if last is not None and 1 < day - last <= 3660:
             passed = range(last + 1, day)
-            line = (f"1 day had no run and will not be reported: {passed[0]}" if len(passed) == 1
-                    else f"{len(passed)} days had no run and will not be reported: "
+            line = (f"1 day had no daily run, and has a log only if one was forced: {passed[0]}" if len(passed) == 1
+                    else f"{len(passed)} days had no daily run, and have logs only if forced: "
                          f"{passed[0]} to {passed[-1]}")
             for each in passed:
                 if each not in self.fates:

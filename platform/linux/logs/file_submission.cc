@@ -117,8 +117,11 @@ bool FileSubmission::ZTXWriteLogForSubmission(std::string_view logType, std::str
   return static_cast<bool>(filed);
 }
 
-Expected<FileSubmission::Destination> FileSubmission::destinationOfNewLog() {
-  const auto statisticsDay = services_.reportedDays.takeEarliest();
+Expected<FileSubmission::Destination> FileSubmission::destinationOfNewLog(
+    std::string_view logType) {
+  const auto dayRead = services_.reportedDays.takeEarliest();
+  // A report that filed no log leaves the day that it read to the run's next log.
+  const auto statisticsDay = logType == kTalliedLogType ? dayRead : std::nullopt;
   const std::int64_t day = statisticsDay.value_or(today());
   const SubmissionPermission permission = submissionPermission(services_.preferences);
   if (permission.covers(day)) return Destination{Place::Pending, day};
@@ -127,15 +130,15 @@ Expected<FileSubmission::Destination> FileSubmission::destinationOfNewLog() {
                       dateText(civilFromDays(*statisticsDay)), textOf(permission))};
 }
 
-Expected<FileSubmission::Place> FileSubmission::placeOfNewLog() {
-  const auto destination = destinationOfNewLog();
+Expected<FileSubmission::Place> FileSubmission::placeOfNewLog(std::string_view logType) {
+  const auto destination = destinationOfNewLog(logType);
   if (!destination) return destination.error();
   return destination->place;
 }
 
 Status FileSubmission::fileLog(std::string_view logType, std::string_view logName,
                                const plist::Dictionary& options, const LogWriter& writer) {
-  const auto destination = destinationOfNewLog();
+  const auto destination = destinationOfNewLog(logType);
   if (!destination) return destination.error();
   const Place place = destination->place;
   const plist::Date now = services_.clock.now();

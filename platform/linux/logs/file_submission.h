@@ -83,7 +83,7 @@ class FileSubmission final : public SubmissionService {
   void submitDiagnosticLogs() override;
 
   /// Where a log made now, from the rows read last, would go; an error when it would not be filed.
-  Expected<Place> placeOfNewLog();
+  Expected<Place> placeOfNewLog(std::string_view logType);
 
   /// Whether `submitDiagnosticLogs` may send logs on.
   bool maySendOn() const { return static_cast<bool>(checkPermission()); }
@@ -119,7 +119,7 @@ class FileSubmission final : public SubmissionService {
   std::string folder(Place place) const;
   std::int32_t today() const;
   Expected<Files> countFiles(Place place) const;
-  Expected<Destination> destinationOfNewLog();
+  Expected<Destination> destinationOfNewLog(std::string_view logType);
   Status fileLog(std::string_view logType, std::string_view logName,
                  const plist::Dictionary& options, const LogWriter& writer);
   /// Puts a written log in place, if the permission still covers it.
