@@ -135,11 +135,16 @@ def start_pcp(duty):
     wanted = duty.folder.parent / "pmlogger.conf"
     wanted.write_text("log mandatory on 1 sec {\n"
                       + "".join(f"  {metric}\n" for metric in metrics) + "}\n")
+    # Metrics derived from others would add to the duty, and pmlogger prints all readings, over and
+    # over, while it waits for the first values of some.
     duty.start("pmlogger", "-h", "127.0.0.1", "-c", wanted, "-l", duty.folder.parent / "log", "-U",
-               "root", duty.folder / "archive", environment={"PMCD_PORT": PMCD_PORT})
+               "root", duty.folder / "archive",
+               environment={"PMCD_PORT": PMCD_PORT, "PCP_DERIVED_CONFIG": ""})
 
 
 def count_pcp(duty):
+    if "check_inst" in (duty.folder.parent / "log").read_text():
+        sys.exit("pmlogger printed readings, which takes far longer than taking them")
     # Each line of a result record that ends with a count is one metric with its instances.
     for line in text(["pmdumplog", duty.folder / "archive"]).splitlines():
         if re.match(r"\s+(inst \[.*\] value|60\.\S+ \(\S+\): .*\bvalue)", line):
