@@ -3,7 +3,9 @@ the kernel's account of a process omits."""
 
 import os
 import shutil
+import signal
 import subprocess
+import sys
 import tempfile
 
 SECTOR = 512
@@ -15,10 +17,11 @@ def call(*command):
 
 
 class BlockDevice:
-    """An ext4 file system on a loop device, mounted on entry. Where the system does not allow that,
-    entering yields None, and `reason` says why."""
+    """An ext4 file system on a loop device, mounted from entry to exit, also when SIGTERM ends the
+    program. Where the system does not allow that, entering yields None, and `reason` says why."""
 
     def __enter__(self):
+        signal.signal(signal.SIGTERM, lambda *_: sys.exit(1))
         self.folder = tempfile.mkdtemp(prefix="tavrel_flash.")
         self.mounted = os.path.join(self.folder, "mounted")
         self.loop = self.reason = None
@@ -28,9 +31,10 @@ class BlockDevice:
                 file.truncate(IMAGE_BYTES)
             # Write everything now, so that nothing is left to write during a measurement.
             call("mkfs.ext4", "-q", "-F", "-E", "lazy_itable_init=0,lazy_journal_init=0", image)
-            self.loop = call("losetup", "--find", "--show", image)
             os.mkdir(self.mounted)
-            call("mount", "-o", "noatime", self.loop, self.mounted)
+            # The kernel detaches a loop device that mount has made when it is unmounted.
+            call("mount", "-o", "loop,noatime", image, self.mounted)
+            self.loop = call("findmnt", "--noheadings", "--output", "SOURCE", self.mounted)
         except (OSError, subprocess.CalledProcessError) as error:
             lines = (getattr(error, "stderr", "") or str(error)).splitlines()
             self.reason = lines[0] if lines else str(error)
@@ -38,10 +42,8 @@ class BlockDevice:
         return self
 
     def __exit__(self, *_):
-        if self.reason is None:
-            call("umount", self.mounted)
-        if self.loop:
-            call("losetup", "--detach", self.loop)
+        if os.path.ismount(self.mounted):
+            call("umount", "--recursive", self.mounted)
         shutil.rmtree(self.folder)
 
     def written(self):
