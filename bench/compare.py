@@ -4,7 +4,8 @@
     bench/compare.py BIN_DIRECTORY PACKAGES SECONDS
 
 PACKAGES holds the unpacked packages; they are mounted over /usr, /etc and /var in this process's
-mount namespace. CPU time is the kernel's for each process at its end, so it includes its start;
+mount namespace, and what programs write there goes to a tmpfs, so that all of it ends with the
+process. CPU time is the kernel's for each process at its end, so it includes its start;
 memory is the sum of the peaks of the processes that stay running; bytes written are those that
 reached the block device of the monitor's own file system.
 """
@@ -13,11 +14,11 @@ import contextlib
 import json
 import os
 import pathlib
+import plistlib
 import re
 import signal
 import subprocess
 import sys
-import tempfile
 import time
 import urllib.request
 
@@ -26,6 +27,8 @@ from flash import BlockDevice
 EXPORTER = "127.0.0.1:9197"
 PMCD_PORT = "44397"
 NAMESPACE = "/var/lib/pcp/pmns"
+PENDING = "var/mobile/Library/Logs/Submission/pending"
+USAGE = "com.norvane.usage."
 
 
 class Duty:
@@ -41,6 +44,19 @@ class Duty:
         self.values = 0
         self.written = disk.written()
 
+    def __enter__(self):
+        return self
+
+    def __exit__(self, kind, *_):
+        """After a failure, ends what still runs, so that the disk can be unmounted."""
+        for process in self.running:
+            process.kill()
+            process.wait()
+        output = self.folder.parent / "output"
+        if kind and output.exists():
+            for line in output.read_text(errors="replace").splitlines()[-3:]:
+                print(f"{self.name}: {line}", file=sys.stderr)
+
     def start(self, *command, environment=None):
         with open(self.folder.parent / "output", "ab") as output:
             self.running.append(subprocess.Popen(
@@ -49,6 +65,8 @@ class Duty:
 
     def stop(self):
         for process in reversed(self.running):
+            if process.poll() is not None:
+                sys.exit(f"{process.args[0]} ended early, with {process.returncode}")
             # Not the peak from wait4, which includes this program before the exec.
             status = pathlib.Path(f"/proc/{process.pid}/status").read_text(encoding="ascii")
             self.memory += int(re.search(r"VmHWM:\s+(\d+)", status)[1])
@@ -65,19 +83,22 @@ class Duty:
         _, status, usage = os.wait4(process.pid, 0)
         process.returncode = 0
         if status != 0:
-            sys.exit(f"{command[0]} ended with {status}: see {self.folder.parent}/output")
+            sys.exit(f"{command[0]} ended with {os.waitstatus_to_exitcode(status)}")
         self.seconds += usage.ru_utime + usage.ru_stime
 
 
 def lay_over(packages):
+    """Returns the folder of a tmpfs."""
+    layers = packages.parent / "layers"
+    layers.mkdir(exist_ok=True)
+    subprocess.run(["mount", "-t", "tmpfs", "tmpfs", layers], check=True)
     for top in ["usr", "etc", "var"]:
-        layer = tempfile.mkdtemp(prefix="compare.", dir="/dev/shm")
-        os.mkdir(f"{layer}/upper")
-        os.mkdir(f"{layer}/work")
-        (packages / top).mkdir(exist_ok=True)
+        for folder in [packages / top, layers / top / "upper", layers / top / "work"]:
+            folder.mkdir(parents=True, exist_ok=True)
         subprocess.run(["mount", "-t", "overlay", "overlay", f"/{top}", "-o",
-                        f"lowerdir={packages / top}:/{top},upperdir={layer}/upper,"
-                        f"workdir={layer}/work"], check=True)
+                        f"lowerdir={packages / top}:/{top},upperdir={layers / top}/upper,"
+                        f"workdir={layers / top}/work"], check=True)
+    return layers
 
 
 def text(command):
@@ -151,28 +172,47 @@ def count_pcp(duty):
             duty.values += 1
 
 
-def start_tavrel(duty, programs, seconds):
+def prepare_tavrel(duty, programs, memory):
+    """Sets up what the operator and the system do before the duty."""
     # Recording happens in memory, below the device's root.
-    run = tempfile.mkdtemp(prefix="compare.", dir="/dev/shm")
-    os.makedirs(f"{run}/tavrel/stat")
-    os.symlink(run, duty.folder / "run")
+    os.makedirs(memory / "run/tavrel/stat")
+    os.symlink(memory / "run", duty.folder / "run")
+    whitelist = duty.folder / "Library/Application Support/Brimhold/Whitelist_Pellio.plist"
+    whitelist.parent.mkdir(parents=True)
+    whitelist.write_bytes(plistlib.dumps({"Usage": {
+        "ScalarKeyPrefixes": {USAGE: {"sig_fig": 2}},
+        "DistributionKeyPrefixes": {USAGE: {"intervals": [1, 10, 25, 50, 75, 90, 1000]}}}}))
+    text([programs / "tavrelctl", "--root", duty.folder, "allow", "--from", "yesterday"])
+    duty.written = duty.disk.written()
+
+
+def start_tavrel(duty, programs, seconds):
     duty.start(programs / "tavrelctl", "stat", "collect", "--seconds", seconds + 60,
                environment={"TAVREL_ROOT": str(duty.folder)})
 
 
 def finish_tavrel(duty, programs):
-    """Runs the rest of tavrel's duty: the hourly fold and the daily run."""
+    """Runs the rest of tavrel's duty: the hourly fold and the daily run, which here reports today,
+    the day of all readings."""
     environment = {"TAVREL_ROOT": str(duty.folder)}
     duty.run(programs / "tavrelctl", "stat", "fold", environment=environment)
-    duty.run(programs / "tavrel", environment=environment)
+    duty.run(programs / "tavrel", "-t", environment=environment)
 
 
 def count_tavrel(duty, programs):
     """Counts each value of a distribution, and a scalar for each sample, except for the processes,
-    which are counted once a minute."""
+    which are counted once a minute. The filed log must have all of these statistics."""
     statistics = json.loads(text([programs / "tavrelctl", "--root", duty.folder, "stat", "list",
-                                  "com.norvane.usage.", "--json"]))
-    scalars = {row["key"].rsplit(".usage.")[1]: row["value"] for row in statistics["scalars"]}
+                                  USAGE, "--json"]))
+    logs = list(duty.folder.glob(f"{PENDING}/log-tallied-*.log"))
+    if len(logs) != 1:
+        sys.exit(f"tavrel has filed {len(logs)} logs")
+    log = plistlib.loads(logs[0].read_bytes())
+    for part, table in [("BHScalars", "scalars"), ("BHDistributions", "distributions")]:
+        missing = {row["key"] for row in statistics[table]} - set(log[part])
+        if missing:
+            sys.exit(f"tavrel's log lacks {', '.join(sorted(missing))}")
+    scalars = {row["key"].removeprefix(USAGE): row["value"] for row in statistics["scalars"]}
     duty.values = scalars["samples"] * (len(scalars) - ("processes" in scalars))
     duty.values += sum(row["count"] for row in statistics["distributions"])
 
@@ -191,7 +231,7 @@ def until(what, answer):
 
 
 def main(programs, packages, seconds):
-    lay_over(packages)
+    memory = lay_over(packages)
     with contextlib.ExitStack() as stack:
         duties = []
         for name in ["collectd", "node_exporter", "PCP", "tavrel"]:
@@ -199,8 +239,9 @@ def main(programs, packages, seconds):
             disk = stack.enter_context(device)
             if disk is None:
                 sys.exit(f"script/compare: no disk for {name}: {device.reason}")
-            duties.append(Duty(name, disk))
+            duties.append(stack.enter_context(Duty(name, disk)))
         collectd, exporter, pcp, tavrel = duties
+        prepare_tavrel(tavrel, programs, memory)
         start_collectd(collectd)
         start_exporter(exporter)
         start_pcp(pcp)
