@@ -86,6 +86,7 @@ class Server:
                 return self
             except OSError:
                 if time.monotonic() > deadline:
+                    self.__exit__()
                     raise
                 time.sleep(0.05)
 

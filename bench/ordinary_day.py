@@ -32,22 +32,28 @@ Step = collections.namedtuple("Step", "written cpu")
 
 
 class OrdinaryDevice:
+    """A device on the block device, which also unmounts its /run, and its server."""
+
     def __init__(self, bin_directory, block_device):
         self.flash = block_device
-        self.device = Device(bin_directory).copy(block_device.mounted)
+        origin = Device(bin_directory)
+        self.device = origin.copy(block_device.mounted)
+        origin.close()
         self.cpu = 0.0
-        self.run_folder = self.device.path("run")
-        os.makedirs(self.run_folder)
-        call("mount", "-t", "tmpfs", "tmpfs", self.run_folder)
+        run_folder = self.device.path("run")
+        os.makedirs(run_folder)
+        call("mount", "-t", "tmpfs", "tmpfs", run_folder)
         for folder in ("run/tavrel/stat", "run/server"):
             os.makedirs(self.device.path(folder))
         self.server = Server(self.device.path("run/server"))
         self.upload_environment = permit_upload(self.device, self.server)
 
-    def close(self):
-        self.server.close()
-        call("umount", self.run_folder)
-        self.device.close()
+    def __enter__(self):
+        self.server.__enter__()
+        return self
+
+    def __exit__(self, *_):
+        self.server.__exit__()
 
     def program(self, name, *arguments, environment=None):
         with open(os.devnull, "r+b") as null:
@@ -138,6 +144,23 @@ def total(steps):
     return Step(sum(step.written for step in steps), sum(step.cpu for step in steps))
 
 
+def play(device, wanted):
+    scalars, distributions = device.fill()
+    print(f"An ordinary day of an unattended device, {DAYS_HELD} days in the store; a sample "
+          f"gives {scalars} scalars and {distributions} measurements")
+    for number in range(1, DAYS + 1):
+        device.begin_day(DAYS_HELD + DAYS - number)
+        steps = device.day()
+        for name, figures in steps.items():
+            written, cpu = total(figures)
+            print(f"  {len(figures):2} x {name:24} {written:12,} bytes {cpu:8.2f} s CPU")
+    written, cpu = total([step for figures in steps.values() for step in figures])
+    megabytes = written / 1e6
+    print(f"  the last day  {megabytes:16.2f} MB"
+          f"{wanted.judge('ordinary day: written to flash, MB', megabytes)}\n"
+          f"  CPU           {cpu:16.2f} s{wanted.judge('ordinary day: CPU, s', cpu)}")
+
+
 def main():
     wanted = Wanted()
     block_device = BlockDevice()
@@ -145,22 +168,8 @@ def main():
         if mounted is None:
             print(f"An ordinary day: not measured, no loop device: {block_device.reason}")
             return
-        device = OrdinaryDevice(sys.argv[1], block_device)
-        scalars, distributions = device.fill()
-        print(f"An ordinary day of an unattended device, {DAYS_HELD} days in the store; a sample "
-              f"gives {scalars} scalars and {distributions} measurements")
-        for number in range(1, DAYS + 1):
-            device.begin_day(DAYS_HELD + DAYS - number)
-            steps = device.day()
-            for name, figures in steps.items():
-                written, cpu = total(figures)
-                print(f"  {len(figures):2} x {name:24} {written:12,} bytes {cpu:8.2f} s CPU")
-        written, cpu = total([step for figures in steps.values() for step in figures])
-        megabytes = written / 1e6
-        print(f"  the last day  {megabytes:16.2f} MB"
-              f"{wanted.judge('ordinary day: written to flash, MB', megabytes)}\n"
-              f"  CPU           {cpu:16.2f} s{wanted.judge('ordinary day: CPU, s', cpu)}")
-        device.close()
+        with OrdinaryDevice(sys.argv[1], block_device) as device:
+            play(device, wanted)
     sys.exit(wanted.status())
 
 

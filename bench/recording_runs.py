@@ -84,7 +84,8 @@ def samples(bin_directory, wanted):
 
 
 class Receiver:
-    """A program that receives from a UDP socket, stopped whenever nothing is measured."""
+    """A program that receives from a UDP socket, stopped whenever nothing is measured. It ends
+    with the `with` block."""
 
     def __init__(self, device, *command):
         self.socket = socket.socket(socket.AF_INET, socket.SOCK_DGRAM)
@@ -110,7 +111,10 @@ class Receiver:
     def round(self, datagrams):
         """Returns CPU time per datagram, in nanoseconds."""
         os.kill(self.process, signal.SIGSTOP)
-        os.waitpid(self.process, os.WUNTRACED)
+        _, status = os.waitpid(self.process, os.WUNTRACED)
+        if not os.WIFSTOPPED(status):
+            self.process = None
+            raise SystemExit(f"a receiver ended with {os.waitstatus_to_exitcode(status)}")
         for datagram in datagrams:
             self.socket.sendto(datagram, self.socket.getsockname())
         before = self.nanoseconds()
@@ -133,9 +137,13 @@ class Receiver:
         with open(f"/proc/{self.process}/status", encoding="ascii") as file:
             return next(int(line.split()[1]) for line in file if line.startswith("VmHWM")) / 1024
 
-    def end(self):
-        os.kill(self.process, signal.SIGKILL)
-        os.waitpid(self.process, 0)
+    def __enter__(self):
+        return self
+
+    def __exit__(self, *_):
+        if self.process:
+            os.kill(self.process, signal.SIGKILL)
+            os.waitpid(self.process, 0)
         self.socket.close()
 
 
@@ -147,9 +155,9 @@ def datagrams_of(lines):
 
 def statsd(bin_directory, wanted):
     print("\nStatsD datagrams on UDP, CPU time of the receiver")
-    with Device() as device:
-        floor = Receiver(device, os.path.join(bin_directory, "tavrel_statsd_floor"))
-        program = Receiver(device, os.path.join(bin_directory, "tavrel-statsd"), "--idle", "0")
+    with (Device() as device,
+          Receiver(device, os.path.join(bin_directory, "tavrel_statsd_floor")) as floor,
+          Receiver(device, os.path.join(bin_directory, "tavrel-statsd"), "--idle", "0") as program):
         for lines in (1, 10):
             datagrams = datagrams_of(lines)
             pairs = [(floor.round(datagrams), program.round(datagrams)) for _ in range(ROUNDS)]
@@ -164,8 +172,6 @@ def statsd(bin_directory, wanted):
               f"  memory of tavrel-statsd at most {peak:.2f} MiB, of which its segment has up to 4"
               f"{wanted.judge('statsd: memory, MiB', peak)}")
         lost = program.lost()
-        floor.end()
-        program.end()
     if lost:
         raise SystemExit(f"{lost} datagrams were lost")
 

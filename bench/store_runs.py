@@ -54,7 +54,9 @@ def main():
         if mounted is None:
             print(f"Bytes that the store writes: no loop device: {block_device.reason}")
             return
-        device = Device(sys.argv[1]).copy(mounted.mounted)
+        origin = Device(sys.argv[1])
+        device = origin.copy(mounted.mounted)
+        origin.close()
         flash = Flash(device, mounted)
         for day in range(DAY - 14, DAY):
             flash.take(day, 7, 86400, 0)

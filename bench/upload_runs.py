@@ -34,7 +34,7 @@ def call(*command):
 
 
 class Server:
-    """Debian's nginx, with its files below `folder`."""
+    """Debian's nginx, with its files below `folder`; runs from entry to exit."""
 
     def __init__(self, folder):
         self.folder = folder
@@ -62,17 +62,25 @@ class Server:
         with open(self.path("nginx.conf"), "w", encoding="ascii") as file:
             file.write(f"{user} daemon off; pid nginx.pid; events {{}} "
                        f"http {{ access_log off; {temporary} {site} }}")
-        self.process = subprocess.Popen(["nginx", "-p", folder, "-c", "nginx.conf", "-e",
+
+    def __enter__(self):
+        self.process = subprocess.Popen(["nginx", "-p", self.folder, "-c", "nginx.conf", "-e",
                                          "error.log"])
         deadline = time.monotonic() + LONGEST
         while True:
             try:
                 socket.create_connection(("127.0.0.1", self.port)).close()
-                break
+                return self
             except ConnectionRefusedError:
                 if time.monotonic() > deadline or self.process.poll() is not None:
-                    raise SystemExit(f"nginx does not listen: see {self.path('error.log')}")
+                    self.__exit__()
+                    with open(self.path("error.log"), encoding="utf-8") as log:
+                        raise SystemExit(f"nginx does not listen: {log.read()}")
                 time.sleep(0.01)
+
+    def __exit__(self, *_):
+        self.process.terminate()
+        self.process.wait()
 
     def path(self, name):
         return os.path.join(self.folder, name)
@@ -84,15 +92,12 @@ class Server:
         """Returns the logs that have arrived, by name, and removes them."""
         folder = self.path("srv/device")
         logs = {}
-        for name in os.listdir(folder):
-            with open(os.path.join(folder, name), "rb") as file:
-                logs[name.removesuffix(".gz")] = file.read()
-        shutil.rmtree(folder)
+        if os.path.isdir(folder):  # nginx makes it for the first log
+            for name in os.listdir(folder):
+                with open(os.path.join(folder, name), "rb") as file:
+                    logs[name.removesuffix(".gz")] = file.read()
+            shutil.rmtree(folder)
         return logs
-
-    def close(self):
-        self.process.terminate()
-        self.process.wait()
 
 
 def make_logs():
@@ -149,13 +154,9 @@ def timed(command, device, environment):
         return wall, usage.ru_utime + usage.ru_stime, int(file.read()) / 1024
 
 
-def main():
-    wanted = Wanted()
-    device = Device(sys.argv[1])
-    server = Server(device.path("server"))
-    logs = make_logs()
+def measure(device, server, logs):
+    """Returns the figures of the uploads and those of curl."""
     environment = permit_upload(device, server)
-
     uploads, curls = [], []
     for _ in range(RUNS):
         outbox = fill(device, logs)
@@ -173,7 +174,15 @@ def main():
             raise SystemExit("tavrel-upload has not sent each log")
         if os.listdir(outbox):
             raise SystemExit("tavrel-upload has left logs behind")
-    server.close()
+    return uploads, curls
+
+
+def main():
+    wanted = Wanted()
+    device = Device(sys.argv[1])
+    logs = make_logs()
+    with Server(device.path("server")) as server:
+        uploads, curls = measure(device, server, logs)
     device.close()
 
     wall, cpu, memory = (statistics.median(column) for column in zip(*uploads))
