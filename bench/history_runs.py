@@ -17,12 +17,11 @@ import sys
 from datetime import datetime, timedelta
 
 from wanted import Wanted
-from whole_runs import DAY, RUNS, STORE, Device, run_once
+from whole_runs import DAY, PENDING, RUNS, STORE, Device, run_once
 
 DAYS = 400
 KEYS = 10_000
 LOGS = 10_000
-PENDING = "var/mobile/Library/Logs/Submission/pending"
 
 
 def keys():
@@ -75,6 +74,8 @@ def main():
           "day and no logs")
     long, short, least = medians((full.daemon("-f"), full), (single.daemon("-f"), single),
                                  (empty.daemon("-f"), empty))
+    for device, waiting in ((full, LOGS), (single, 0)):
+        device.require_logs(waiting + 1 + RUNS)
     print(f"  tavrel -f          {long:8.2f} ms CPU, one day {short:.2f} ms, empty {least:.2f} ms"
           f"{wanted.judge('long history: tavrel -f, ratio to one day', long / short)}")
     tool = os.path.join(full.bin, "tavrelctl")

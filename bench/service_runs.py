@@ -26,7 +26,7 @@ import sys
 import time
 
 from wanted import Wanted
-from whole_runs import Device, scalar_lines
+from whole_runs import PENDING, Device, scalar_lines
 
 PEERS = 1000
 MESSAGES_OF_PEER = 10
@@ -36,7 +36,6 @@ SCALARS = 2000
 
 LONGEST = 60  # seconds to wait for anything
 NAME = "com.norvane.tallied.tavrel"
-PENDING = "var/mobile/Library/Logs/Submission/pending"
 SEALS = fcntl.F_SEAL_SHRINK | fcntl.F_SEAL_GROW | fcntl.F_SEAL_WRITE
 IN_CREATE, IN_MOVED_TO = 0x100, 0x80
 

@@ -145,6 +145,7 @@ def run(device, prefix=()):
     process.returncode = os.waitstatus_to_exitcode(status)
     if process.returncode != 0:
         raise SystemExit(f"tavrel ended with status {process.returncode}")
+    device.require_logs(1)
     return usage.ru_utime + usage.ru_stime, int(account["write_bytes"])
 
 
@@ -222,6 +223,7 @@ def busy_day(devices):
     written = statistics.median(accounts)
     device = devices.make(BUSY)
     memory = peak_mebibytes(device.daemon("-d"), device.environment)
+    device.require_logs(1)
     device.close()
     print(f"  CPU                    {statistics.median(times) * 1e3:10.2f} ms "
           f"({min(times) * 1e3:.2f} to {max(times) * 1e3:.2f})\n"

@@ -11,6 +11,7 @@ Instructions are counted with valgrind if it is installed. Exits with 1 when a w
 """
 
 import copy
+import glob
 import os
 import plistlib
 import random
@@ -29,6 +30,7 @@ RUNS = 15
 DAY = int(time.time() // 86400) - 1
 STORE = "var/mobile/Library/Brimhold/BHDataStore.sqlitedb"
 WHITELIST = "Library/Application Support/Brimhold/Whitelist_Pellio.plist"
+PENDING = "var/mobile/Library/Logs/Submission/pending"
 
 
 class Device:
@@ -65,6 +67,12 @@ class Device:
 
     def daemon(self, mode):
         return [os.path.join(self.bin, "tavrel"), mode]
+
+    def require_logs(self, count):
+        """Ends the benchmark unless runs have filed that many logs: one that files none is fast."""
+        filed = len(glob.glob("log-tallied-*.log", root_dir=self.path(PENDING)))
+        if filed != count:
+            raise SystemExit(f"{filed} logs were filed, not {count}")
 
     def close(self):
         shutil.rmtree(self.root)
@@ -116,6 +124,11 @@ def measure(label, command, environment, floor=None, runs=RUNS):
     return median, floor_median, memory
 
 
+def measured_runs(runs):
+    """How often `measure` runs a command: also to warm up, and for the peak."""
+    return 1 + runs + 1
+
+
 def scalar_lines(count):
     return [f"scalar\t{DAY}\tcom.example.scalar.{i:06}\t{i * 7919}\n" for i in range(count)]
 
@@ -152,6 +165,7 @@ def daily_scalars(bin_directory, wanted):
                      str(DAY))
     median, libraries, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
                                    ("Expat, MD5 and SQLite alone", floor), runs=40)
+    device.require_logs(measured_runs(40))
     wanted.calibrate(libraries)
     print(wanted.judge("2,000 scalars, ms", median))
     device.close()
@@ -185,6 +199,7 @@ def distributions(bin_directory, wanted):
              f"WHERE day = {DAY} GROUP BY key")
     median, _, _ = measure("tavrel -f", device.daemon("-f"), device.environment,
                            ("sqlite3, a row per value, indexed", ["sqlite3", table, query]))
+    device.require_logs(measured_runs(RUNS))
     print(wanted.judge("1,000 distributions, ms", median))
     device.close()
 
@@ -269,6 +284,7 @@ def growth(bin_directory):
             env=device.environment, capture_output=True, text=True, check=True).stderr
         collected = next(line for line in output.splitlines() if "Collected" in line)
         counts[count] = int(collected.split(":")[1].replace(",", ""))
+        device.require_logs(2)
         device.close()
     slope = (counts[50_000] - counts[1000]) / 49_000
     for count, instructions in counts.items():
