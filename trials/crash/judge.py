@@ -16,6 +16,7 @@ import hashlib
 import pathlib
 import random
 import shutil
+import signal
 import subprocess
 import sys
 import tempfile
@@ -193,6 +194,8 @@ def main():
     parser.add_argument("--script", default="script/crash-test")
     options = parser.parse_args()
     mount_in_private()
+    # Detaches the loop device.
+    signal.signal(signal.SIGTERM, lambda *_: sys.exit(128 + signal.SIGTERM))
     work = pathlib.Path(tempfile.mkdtemp(prefix="tavrel_crash.", dir="/dev/shm"))
     try:
         judge = Judge(options, work)
