@@ -1,6 +1,7 @@
 // Input to tavrelctl: JSON, values on the command line, structured records, statistics buffers to
-// build, logs to show. Whatever JSON can hold must read back from it, a buffer that was built must
-// parse, and a record file must give the same lines whether it grows or is complete from the start.
+// build, logs to show. Whatever JSON can hold must read back from it, a buffer that was built
+// without raw bytes, counts or keys above the largest must parse, and a record file must give the
+// same lines whether it grows or is complete from the start.
 //
 // Input: a byte that chooses the reader, then the text.
 #include <nlohmann/json.hpp>
@@ -69,14 +70,31 @@ void readRecords(std::string_view text, std::size_t first) {
   require(static_cast<bool>(growing.wholeness()) == static_cast<bool>(whole.wholeness()));
 }
 
+/// Whether the buffer built from a document must parse: it has a record, and no entry can make a
+/// wrong one.
+bool makesGoodRecords(const plist::Value& document) {
+  constexpr std::int64_t kLargestKey = 0x30000000;
+  const plist::Array entries = document.dictionary().array("entries");
+  for (std::size_t i = 0; i < entries.size(); ++i) {
+    const plist::Value entry = entries.at(i);
+    const plist::Dictionary record = entry.dictionary();
+    if (record && (record.contains("hex") || record.contains("count"))) return false;
+    const plist::Value key = record ? record.get("key") : entry.array().at(0);
+    const auto number = key.number();
+    if (number && number->int64() > kLargestKey) return false;
+  }
+  return !entries.empty();
+}
+
 void build(std::string_view text) {
   const auto document = parseJsonValue(text);
   if (!document) return;
   const auto buffer = buildStatistics(*document);
   if (!buffer) return require(!buffer.error().message.empty());
   ASPContext context;
-  ASPParseBufferToCxt(context, asBytes(*buffer));
+  const int parsed = ASPParseBufferToCxt(context, asBytes(*buffer));
   ASPReleaseContext(context);
+  require(parsed == 1 || !makesGoodRecords(*document));
 }
 
 void showLog(ByteSpan bytes) {
