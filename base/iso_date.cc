@@ -4,7 +4,6 @@
 #include <cmath>
 #include <cstdint>
 
-#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "base/text.h"
@@ -13,9 +12,6 @@ namespace tavrel {
 namespace {
 
 constexpr auto kEpoch = static_cast<std::int64_t>(plist::Date::kEpoch);
-
-// The range of the calendar in base/civil_time.h, in seconds either side of the epoch, rounded up.
-constexpr double kLargestSeconds = 3.2e16;
 
 // Two digits at `position` that do not exceed `largest`.
 std::optional<unsigned> parseTwoDigits(std::string_view text, std::size_t position,
@@ -51,12 +47,10 @@ std::optional<plist::Date> parseAnyForm(std::string_view text) {
 }  // namespace
 
 bool appendIsoInstant(std::string& out, plist::Date instant) {
-  const double seconds = std::floor(instant.secondsSinceEpoch());
-  if (!(std::abs(seconds) <= kLargestSeconds)) return false;
-  const CivilTime time = civilFromSeconds(static_cast<std::int64_t>(seconds) + kEpoch);
-  if (!isValid(time.date)) return false;
-  out += dateText(time.date);
-  appendFormat(out, "T%02u:%02u:%02uZ", time.hour, time.minute, time.second);
+  const auto time = civilTimeOf(instant);
+  if (!time) return false;
+  out += dateText(time->date);
+  appendFormat(out, "T%02u:%02u:%02uZ", time->hour, time->minute, time->second);
   return true;
 }
 

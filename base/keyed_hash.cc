@@ -1,7 +1,6 @@
 #include "base/keyed_hash.h"
 
 #include <bit>
-#include <cstring>
 #include <random>
 
 namespace tavrel {
@@ -42,9 +41,11 @@ struct SipState {
   }
 };
 
+// Little-endian on every machine: the length of the text goes into the last word's highest byte.
 std::uint64_t wordAt(const char* at, std::size_t length) {
   std::uint64_t word = 0;
-  if (length != 0) std::memcpy(&word, at, length);  // an empty text may have a null pointer
+  for (std::size_t i = 0; i < length; ++i)
+    word |= std::uint64_t{static_cast<unsigned char>(at[i])} << (8 * i);
   return word;
 }
 

@@ -11,7 +11,7 @@ struct HashKey {
   std::uint64_t low, high;
 };
 
-/// SipHash-1-3. Values differ between byte orders.
+/// SipHash-1-3.
 std::uint64_t sipHash(std::string_view text, const HashKey& key);
 
 /// Uses a random key per process, so that the author of the texts cannot make them collide. Values

@@ -1,5 +1,6 @@
 // Every limit on data from outside, with its unit and its reason. The code that drops or refuses
-// something because of a limit reports it.
+// something because of a limit reports it, except
+// where it is said here.
 #pragma once
 
 #include <cstddef>
@@ -23,7 +24,7 @@ inline constexpr std::size_t kPropertyListValues = 1'000'000;
 inline constexpr std::size_t kPropertyListBytes = 64U << 20;
 
 /// Bytes of the whitelist file. Ten thousand keys with options take one MiB. A larger file counts
-/// as unreadable, which keeps the run below 64 MiB of memory.
+/// as unreadable. The worst file of this size takes some 100 MiB of memory.
 inline constexpr std::size_t kWhitelistBytes = 4U << 20;
 
 /// Findings listed for one whitelist. Nobody reads more at once, and each stores its location.
@@ -159,7 +160,7 @@ inline constexpr std::size_t kDesktopFiles = 1'000'000;
 inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 
 /// Languages in one list. Matching compares each preferred language with each available one; the
-/// system's own list of all locales has some 500.
+/// system's own list of all locales has some 500. Further ones are left out without a line.
 inline constexpr std::size_t kLanguages = 1'000;
 
 /// Bytes of a drive's reading, of some fifty figures.

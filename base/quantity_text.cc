@@ -39,9 +39,10 @@ std::string quantityText(double value, std::string_view unit) {
   int prefix = kNoPrefix;
   if (unit != "°C" && std::isfinite(value) && value != 0) {
     const int largest = unit == "s" ? kNoPrefix : kLargestPrefix;
-    for (; std::abs(value) < 1 && prefix > 0; --prefix)
+    // A value that would round to 1000 is shown with the next prefix.
+    for (; std::abs(value) < 0.9995 && prefix > 0; --prefix)
       value *= 1000;
-    for (; std::abs(value) >= 1000 && prefix < largest; ++prefix)
+    for (; std::abs(value) >= 999.5 && prefix < largest; ++prefix)
       value /= 1000;
   }
   return format("%s %s%s", significant(value), kPrefixes[prefix], unit);

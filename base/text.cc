@@ -4,7 +4,6 @@
 #include <cmath>
 #include <cstdio>
 
-#include "base/civil_time.h"
 #include "base/utf8.h"
 
 namespace tavrel {
@@ -15,8 +14,8 @@ using plist::Kind;
 // Up to this number every integer is exact as a double, so its digits read back to it.
 constexpr double kLargestPlainInteger = 9007199254740992.0;
 
-// The calendar arithmetic does not cover later dates.
-constexpr double kLargestSeconds = 3e16;
+// The range of the calendar in base/civil_time.h, in seconds either side of the epoch, rounded up.
+constexpr double kLargestSeconds = 3.2e16;
 
 template <class Integer>
 std::string integerText(Integer value) {
@@ -93,13 +92,23 @@ std::string numberText(const plist::Number& value) {
   }
 }
 
+std::optional<CivilTime> civilTimeOf(plist::Date instant) {
+  // Seconds since 1970 would be rounded.
+  const double seconds = std::floor(instant.secondsSinceEpoch());
+  if (!(std::abs(seconds) <= kLargestSeconds)) return std::nullopt;
+  constexpr auto kEpoch = static_cast<std::int64_t>(plist::Date::kEpoch);
+  const CivilTime time = civilFromSeconds(static_cast<std::int64_t>(seconds) + kEpoch);
+  if (!isValid(time.date)) return std::nullopt;
+  return time;
+}
+
 std::string dateText(plist::Date date) {
-  const double seconds = std::floor(date.secondsSince1970());
-  if (!(std::abs(seconds) < kLargestSeconds)) return std::string("@").append(numberText(seconds));
-  const CivilTime time = civilFromSeconds(static_cast<std::int64_t>(seconds));
+  const auto time = civilTimeOf(date);
+  if (!time) return std::string("@").append(numberText(std::floor(date.secondsSince1970())));
   char clock[24];
-  std::snprintf(clock, sizeof clock, " %02u:%02u:%02u +0000", time.hour, time.minute, time.second);
-  return dateText(time.date) + clock;
+  std::snprintf(clock, sizeof clock, " %02u:%02u:%02u +0000", time->hour, time->minute,
+                time->second);
+  return dateText(time->date) + clock;
 }
 
 void appendHex(std::string& out, ByteSpan bytes) {

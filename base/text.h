@@ -6,9 +6,11 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 
+#include "base/civil_time.h"
 #include "base/plist.h"
 
 namespace tavrel {
@@ -18,6 +20,9 @@ namespace tavrel {
 /// are "inf" and "-inf", negative zero is "-0", not-a-number is "nan" whatever its sign.
 std::string numberText(double value);
 std::string numberText(const plist::Number& value);
+
+/// The second in which an instant lies, in UTC; nothing for instants outside the calendar.
+std::optional<CivilTime> civilTimeOf(plist::Date instant);
 
 /// "2026-11-16 18:02:18 +0000", in UTC, without fractions of a second. Instants outside the
 /// calendar are "@" and the number of seconds since 1970.

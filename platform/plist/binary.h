@@ -21,7 +21,8 @@
 namespace tavrel::plist {
 
 /// Keys are in the order of their bytes. Fails for a value that is or contains null, and for a
-/// document that the limits of base/limits.h would refuse to read.
+/// document that the limits of base/limits.h would refuse to read, where malformed UTF-8 counts
+/// with its own bytes.
 Expected<std::string> writeBinary(const Value& value);
 
 /// The value is the caller's own: a container or data object that the document refers to from

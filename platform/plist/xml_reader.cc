@@ -290,7 +290,8 @@ void XmlReader::endScalar() {
       return fail("\"" + excerpt(text_) + "\" is not a number in the range of a double");
     case Element::Date:
       if (const auto date = parseIsoInstant(trimmed(text_))) return add(*date);
-      return fail("\"" + excerpt(text_) + "\" is not a date of the form YYYY-MM-DDTHH:MM:SSZ");
+      return fail("\"" + excerpt(text_) +
+                  "\" is not a date: give one that exists, as YYYY-MM-DDTHH:MM:SSZ");
     case Element::Data:
       if (readBase64(text_, data_)) return add(Data(data_));
       return fail("the text of <data> is not base64");

@@ -26,7 +26,8 @@ TEST(Base64, RefusesWrongLengthsAndPadding) {
 }
 
 TEST(Dates, AreReadAsTheyAreWritten) {
-  for (const double seconds : {0.0, -1.5, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
+  for (const double seconds :
+       {0.0, -1.5, -0.25, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
     const auto date = plist::Date::sinceEpoch(seconds);
     EXPECT_EQ(*parseIsoDate(isoDateText(date)), date) << isoDateText(date);
   }
@@ -41,9 +42,7 @@ TEST(Hash, IsSipHash) {
   const HashKey key{0x0706050403020100, 0x0F0E0D0C0B0A0908};
   EXPECT_EQ(sipHash("", key), 0xABAC0158050FC4DC);
   EXPECT_EQ(sipHash("aaaaaaaa", key), 0x8FB9BDDF35C1D145);
-  if constexpr (std::endian::native == std::endian::little) {
-    EXPECT_EQ(sipHash("abcdefghijklmnopqrstuvw", key), 0x276C7C401120195C);
-  }
+  EXPECT_EQ(sipHash("abcdefghijklmnopqrstuvw", key), 0x276C7C401120195C);
   EXPECT_EQ(keyedHash("a"), keyedHash("a"));
   EXPECT_NE(keyedHash("a"), sipHash("a", {0, 0}));
 }

@@ -127,10 +127,10 @@ TEST(Value, AssignmentOfItselfAndOfItsOwnPartIsSafe) {
   EXPECT_TRUE(names.empty());
 }
 
-// Beyond eight entries there is an index, so compare random changes with a plain list of keys.
+// Beyond sixteen entries there is an index, so compare random changes with a plain list of keys.
 TEST(Dictionary, KeepsOrderAndContentThroughManyChanges) {
   std::mt19937 random(7);
-  for (const unsigned keyCount : {4U, 9U, 20U, 500U}) {
+  for (const unsigned keyCount : {4U, 16U, 17U, 500U}) {
     Dictionary dictionary;
     std::vector<std::string> order;
     std::map<std::string, int> content;

@@ -43,6 +43,7 @@ TEST(Text, WritesObjectsAsPeopleReadThem) {
             R"(", "others": [[], 1, 0, "2026-11-16 18:02:18 +0000", "<0af0>", {}, nan]})");
   EXPECT_EQ(textOf("plain \"text\"\n"), "plain \"text\"\n");
   EXPECT_EQ(dateText(plist::Date::since1970(-0.5)), "1969-12-31 23:59:59 +0000");
+  EXPECT_EQ(dateText(plist::Date::sinceEpoch(800'000'000.9999999)), "2026-05-09 06:13:20 +0000");
   EXPECT_EQ(dateText(plist::Date::since1970(-1e300)), "@-1e+300");
   EXPECT_EQ(textOf(plist::Data(ByteSpan())), "<>");
   EXPECT_EQ(textOf({}), "(null)");
@@ -145,10 +146,12 @@ TEST(Quantities, AreInTheUnitsThatPeopleKnow) {
   for (const auto& [value, unit] :
        {std::pair(41.25, "°C"), std::pair(-0.125, "°C"), std::pair(0.0, "s"),
         std::pair(12345e-9, "s"), std::pair(0.25, "s"), std::pair(119.97, "s"),
-        std::pair(123456.0, "s"), std::pair(2.4e9, "Hz"), std::pair(1e-13, "F")})
+        std::pair(123456.0, "s"), std::pair(2.4e9, "Hz"), std::pair(1e-13, "F"),
+        std::pair(999.6, "Hz"), std::pair(0.0009997, "V"), std::pair(999.6, "s")})
     quantities += quantityText(value, unit) + "; ";
   EXPECT_EQ(quantities,
-            "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; ");
+            "41.3 °C; -0.125 °C; 0 s; 12.3 µs; 250 ms; 120 s; 123456 s; 2.4 GHz; 0.1 pF; "
+            "1 kHz; 1 mV; 1000 s; ");
   for (const double bytes : {0.0, 1.0, 1023.0, 1024.0, 1536.0, 1048570.0, -2048.0, 0x1p63})
     sizes += sizeText(bytes) + "; ";
   EXPECT_EQ(sizes, "0 bytes; 1 byte; 1023 bytes; 1.0 KiB; 1.5 KiB; 1.0 MiB; -2.0 KiB; 8.0 EiB; ");

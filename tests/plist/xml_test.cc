@@ -153,7 +153,7 @@ TEST(Xml, ErrorsSayWhatAndWhere) {
        "30: \"18446744073709551616\" is not a 64-bit integer"},
       {"<real>1e999</real>", "12: \"1e999\" is not a number in the range of a double"},
       {"<date>2026-02-29T00:00:00Z</date>",
-       "27: \"2026-02-29T00:00:00Z\" is not a date of the form YYYY-MM-DDTHH:MM:SSZ"},
+       "27: \"2026-02-29T00:00:00Z\" is not a date: give one that exists, as YYYY-MM-DDTHH:MM:SSZ"},
       {"<data>YQ==YQ==</data>", "15: the text of <data> is not base64"}};
   for (const auto& [body, reason] : rows)
     EXPECT_EQ(errorOf(wrapped(body)), "XML property list, line 3, column " + reason) << body;

@@ -51,6 +51,9 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
        "JSON/$date: not a date: today: give YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD"},
       {R"({"$data": "", "x": 1})",
        "JSON/x: \"$data\" must be the only member of its object, and a string"},
+      {R"({"$data": "AA==", "$$data": "QUJD"})",
+       "JSON/$$data: \"$data\" must be the only member of its object, and a string"},
+      {std::string(1000, '1'), "number overflow parsing '" + std::string(275, '1') + "..."},
       {R"({"$x": 1})", "JSON/$x: \"$x\" is not a known form: write a key that begins with $ as $$"},
       {std::string(200, '['), "JSON: nested too deeply"}};
   for (const auto& [text, message] : kCases) {

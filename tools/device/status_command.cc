@@ -53,10 +53,9 @@ DeviceStatus takeStatus(ToolContext& context) {
   const auto lastDay =
       context.preferences().ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun);
   if (hasRun) status.lastDay = lowInt32(lastDay);
-  if (const auto version =
-          context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain).string()) {
-    status.osVersion = *version;
-  }
+  const plist::Value osVersion =
+      context.preferences().ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain);
+  if (const auto version = osVersion.string()) status.osVersion = *version;
   status.isStateReadable = !context.hasComplaints();
   status.storePath = context.storeForReading().path();
   status.storeBytes = bytesOfStore(status.storePath);

@@ -105,7 +105,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
     if (levels_.back().isSpecial) {
       const plist::Entry& only = *object.begin();
       const auto text = only.value.string();
-      if (object.size() != 1 || !text) {
+      if (levels_.back().members != 1 || !text) {
         return fail(format("\"%s\" must be the only member of its object, and a string", only.key));
       }
       auto meant = valueOfSpecial(only.key, *text);
@@ -133,7 +133,8 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  private:
   struct Level {
     plist::Value container;
-    std::string key;         // of the next member
+    std::string key;  // of the next member
+    std::size_t members = 0;
     bool isSpecial = false;  // a member with one of the special names was seen
   };
 
@@ -155,6 +156,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
       return true;
     }
     auto object = level.container.dictionary();
+    ++level.members;
     std::string_view key = level.key;
     if (isSpecial(key)) {
       level.isSpecial = true;
@@ -181,6 +183,17 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   std::string message_;
   std::size_t count_ = 0;
 };
+
+// Numbers, texts and keys in messages may be as long as the document.
+std::string shortened(std::string message) {
+  constexpr std::size_t kLongest = 300;
+  if (message.size() <= kLongest) return message;
+  std::size_t length = kLongest;
+  while ((message[length] & 0xC0) == 0x80)
+    --length;
+  message.resize(length);
+  return message + "...";
+}
 
 }  // namespace
 
@@ -216,7 +229,7 @@ Json jsonOf(const plist::Value& value) {
 Expected<plist::Value> parseJsonValue(std::string_view text) {
   ValueBuilder builder;
   if (!nlohmann::json::sax_parse(text.begin(), text.end(), &builder)) {
-    return Error{builder.message()};
+    return Error{shortened(builder.message())};
   }
   return builder.takeResult();
 }
