@@ -116,8 +116,8 @@ TEST(LiveMachineTest, ShowsTheInterfacesOfProcessOne) {
     LiveMachine live(device.root, device.log);
     return Subscribed(live).update();
   };
-  device.write("/proc/net/dev", "one\ntwo\nlo: 1 2\n");
-  EXPECT_EQ(shown(), "lo.rx_bytes=1 lo.rx_packets=2 ");
+  device.write("/proc/net/dev", "one\ntwo\na=b: 1 2\n");
+  EXPECT_EQ(shown(), "a=b.rx_bytes=1 a=b.rx_packets=2 ");
   device.write("/proc/1/net/dev", "one\ntwo\neth0: 3 4\n");
   EXPECT_EQ(shown(), "eth0.rx_bytes=3 eth0.rx_packets=4 ");
 }

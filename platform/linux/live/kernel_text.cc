@@ -83,8 +83,8 @@ std::string_view takeLine(std::string_view& text) {
   return line;
 }
 
-std::string_view takeToken(std::string_view& line) {
-  const auto isBetween = [](char c) { return isBlank(c) || c == ':' || c == '='; };
+std::string_view takeToken(std::string_view& line, char separator) {
+  const auto isBetween = [=](char c) { return isBlank(c) || c == ':' || c == separator; };
   const auto* const begin = std::find_if_not(line.begin(), line.end(), isBetween);
   const auto* const end = std::find_if(begin, line.end(), isBetween);
   line.remove_prefix(static_cast<std::size_t>(end - line.begin()));

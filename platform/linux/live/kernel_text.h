@@ -34,8 +34,8 @@ std::int64_t saturatingSum(std::int64_t a, std::int64_t b);
 /// Takes the next line, without its end.
 std::string_view takeLine(std::string_view& text);
 
-/// Takes the next token of a line; blanks, ':' and '=' separate tokens. Empty at the end.
-std::string_view takeToken(std::string_view& line);
+/// Takes the next token of a line; blanks, ':' and `separator` separate tokens. Empty at the end.
+std::string_view takeToken(std::string_view& line, char separator = ' ');
 
 /// A name of the kernel as part of a channel's name: printable ASCII without blanks, of at most 64
 /// bytes. A name that had to be changed ends in '~' and a hash, so that different names stay

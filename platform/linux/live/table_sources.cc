@@ -140,6 +140,7 @@ constexpr Figure kMemoryUse[] = {
 
 // "some avg10=0.00 avg60=0.00 avg300=0.00 total=0": the last token is the ninth.
 constexpr std::size_t kPressureTotal = 8;
+constexpr TableForm kPressureForm{.separator = '='};
 constexpr Figure kPressure[] = {
     {"some", kPressureTotal, "pressure_some", kMicroseconds, {}, kItself},
     {"full", kPressureTotal, "pressure_full", kMicroseconds, {}, kItself},
@@ -251,7 +252,11 @@ void addPressure(const DeviceRoot& root, LiveSource& source) {
     const std::string name(resource);
     addFigures(
         root.path("/proc/pressure/" + name),
-        {.group = "Pressure", .subGroup = resource, .prefix = name + '.', .figures = kPressure},
+        {.group = "Pressure",
+         .subGroup = resource,
+         .prefix = name + '.',
+         .figures = kPressure,
+         .form = kPressureForm},
         source);
   }
 }
@@ -299,10 +304,10 @@ void addControlGroups(const DeviceRoot& root, LiveSource& source) {
     };
     add("cpu.stat", kGroupCpu, prefix);
     add("memory.events", kGroupEvents, prefix);
-    add("io.stat", kGroupIo, prefix, kOneRow);
+    add("io.stat", kGroupIo, prefix, {.key = TableForm::kNoKey, .separator = '='});
     for (const std::string_view resource : kResources) {
       const std::string name(resource);
-      add(name + ".pressure", kGroupPressure, prefix + name + '_');
+      add(name + ".pressure", kGroupPressure, prefix + name + '_', kPressureForm);
     }
     addAttributes(slice.path, {group, slice.name, kPlain}, prefix, kGroupAttributes, Speed::Quick,
                   source);

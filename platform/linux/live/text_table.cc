@@ -12,9 +12,9 @@ namespace tavrel::live {
 namespace {
 
 /// How many tokens remain in a line.
-std::size_t tokensIn(std::string_view line) {
+std::size_t tokensIn(std::string_view line, const TableForm& form) {
   std::size_t count = 0;
-  while (!takeToken(line).empty())
+  while (!takeToken(line, form.separator).empty())
     ++count;
   return count;
 }
@@ -33,7 +33,7 @@ void forEachRow(std::string_view text, const TableForm& form, const Callback& ca
     std::string_view rest = line;
     const std::string_view key = keyOfLine(rest, form);
     if (key.empty() && form.key != TableForm::kNoKey) continue;
-    callback(key, tokensIn(line));
+    callback(key, tokensIn(line, form));
   }
 }
 
@@ -55,11 +55,11 @@ std::string_view keyOfLine(std::string_view& line, const TableForm& form) {
     return {};
   }
   if (form.key == TableForm::kNoKey) return {};
-  if (form.key == 0) return takeToken(line);
+  if (form.key == 0) return takeToken(line, form.separator);
   std::string_view ahead = line;
   std::string_view key;
   for (std::size_t i = 0; i <= form.key; ++i)
-    key = takeToken(ahead);
+    key = takeToken(ahead, form.separator);
   return key;
 }
 
@@ -80,7 +80,7 @@ void TableReader::read(std::string_view text, std::span<std::int64_t> slots) con
     std::string_view token;
     for (const Cell& cell : cells_) {
       while (next <= cell.token) {
-        token = takeToken(line);
+        token = takeToken(line, form_.separator);
         if (token.empty()) break;
         ++next;
       }

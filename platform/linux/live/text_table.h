@@ -24,6 +24,7 @@ struct TableForm {
   std::size_t key = 0;         // token that names the row; `kNoKey` when all lines are one row
   std::string_view mark = {};  // dropped at the beginning of a line
   std::size_t headings = 0;    // lines before the first row
+  char separator = ' ';        // of tokens, besides blanks and ':'
 };
 
 /// Returns the key of a line; when that is the first token, moves `line` past it. Empty for empty
