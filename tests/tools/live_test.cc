@@ -197,9 +197,15 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
         {"/sys/fs/cgroup/a.slice/memory.events", "low 0\noom_kill 1\n"},
         {"/sys/fs/cgroup/a.slice/memory.current", "4096\n"},
         {"/sys/fs/cgroup/a.slice/memory.peak", "max\n"},
+        // The mapping passes its figures on to the disks; two devices have had no I/O.
         {"/sys/fs/cgroup/a.slice/io.stat",
-         "8:0 rbytes=1 wbytes=2 rios=3 wios=4 dbytes=0 dios=0\n8:16 rbytes=10 wbytes=20 rios=30 "
-         "wios=40 dbytes=0 dios=0\n"}},
+         "254:0 \n254:1 rbytes=5 wbytes=5 rios=5 wios=5\n7:1 8:0 rbytes=1 wbytes=2 rios=3 wios=4 "
+         "dbytes=0 dios=0\n8:16 cost.usage=9 rbytes=10 wbytes=20 rios=30 wios=40\n"},
+        {"/sys/block/sda/dev", "8:0\n"},
+        {"/sys/block/sda/device/x", ""},
+        {"/sys/block/sdb/dev", "8:16\n"},
+        {"/sys/block/sdb/device/x", ""},
+        {"/sys/block/dm-1/dev", "254:1\n"}},
        "a.slice.cpu=10 a.slice.cpu_throttles=2 a.slice.memory_oom_kills=1 "
        "a.slice.io_reads=33 a.slice.io_writes=44 a.slice.io_read_bytes=11 "
        "a.slice.io_written_bytes=22 a.slice.memory=4096 "},

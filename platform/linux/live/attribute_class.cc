@@ -15,12 +15,6 @@ std::string withNumber(std::string_view pattern, std::string_view number) {
   return text;
 }
 
-// The first line of the file; nothing when there is none.
-std::string lineOf(const std::string& path, TextBuffer& buffer) {
-  auto text = readKernelFile(path, ReadMode::Once, buffer);
-  return text ? std::string(takeLine(*text)) : std::string();
-}
-
 // Files with the device's power state: reading the sensor of a sleeping drive would wake it.
 std::vector<std::string> powerStatusOf(const std::string& path) {
   std::vector<std::string> files;
@@ -52,7 +46,6 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
   std::vector<NamedDevice> devices;
   std::vector<std::string> entries;
   std::unordered_map<std::string, std::size_t> counts;
-  TextBuffer buffer;
   for (std::string& name : namesIn(base)) {
     if (!name.starts_with(entry)) continue;
     if (devices.size() == limits::kLiveDevices) {
@@ -60,7 +53,7 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
       break;
     }
     std::string path = base + '/' + name;
-    std::string called = label.empty() ? name : lineOf(path + '/' + std::string(label), buffer);
+    std::string called = label.empty() ? name : firstLine(path + '/' + std::string(label));
     if (called.empty()) called = name;
     ++counts[called];
     devices.push_back({std::move(path), std::move(called)});

@@ -20,14 +20,6 @@ namespace {
 
 constexpr std::int64_t kMostProcessors = 8192;
 
-std::string_view takeWord(std::string_view& line) {
-  const std::size_t begin = std::min(line.find_first_not_of(" \t"), line.size());
-  line.remove_prefix(begin);
-  const std::string_view word = line.substr(0, line.find_first_of(" \t"));
-  line.remove_prefix(word.size());
-  return word;
-}
-
 // The numbers of the processors in the heading.
 std::vector<std::uint32_t> processorsIn(std::string_view heading) {
   std::vector<std::uint32_t> numbers;

@@ -79,6 +79,12 @@ std::optional<std::string_view> KernelFile::read(DescriptorBudget& budget, TextB
   return text;
 }
 
+std::string firstLine(const std::string& path) {
+  TextBuffer buffer;
+  const auto text = readKernelFile(path, ReadMode::Once, buffer);
+  return text ? std::string(text->substr(0, text->find('\n'))) : std::string();
+}
+
 std::vector<std::string> namesIn(const std::string& folder) {
   std::vector<std::string> names;
   const std::unique_ptr<DIR, int (*)(DIR*)> stream(opendir(folder.c_str()), closedir);

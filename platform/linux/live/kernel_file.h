@@ -62,6 +62,9 @@ class KernelFile {
   Descriptor descriptor_;
 };
 
+/// The first line of a file, without its end; empty when it cannot be read.
+std::string firstLine(const std::string& path);
+
 /// Names in a folder, sorted, without "." and ".."; none when it cannot be read.
 std::vector<std::string> namesIn(const std::string& folder);
 

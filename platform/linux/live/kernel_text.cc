@@ -83,6 +83,13 @@ std::string_view takeLine(std::string_view& text) {
   return line;
 }
 
+std::string_view takeWord(std::string_view& text) {
+  const auto* const begin = std::find_if_not(text.begin(), text.end(), isBlank);
+  const auto* const end = std::find_if(begin, text.end(), isBlank);
+  text.remove_prefix(static_cast<std::size_t>(end - text.begin()));
+  return {begin, end};
+}
+
 std::string_view takeToken(std::string_view& line, char separator) {
   const auto isBetween = [=](char c) { return isBlank(c) || c == ':' || c == separator; };
   const auto* const begin = std::find_if_not(line.begin(), line.end(), isBetween);

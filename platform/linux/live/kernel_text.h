@@ -34,6 +34,9 @@ std::int64_t saturatingSum(std::int64_t a, std::int64_t b);
 /// Takes the next line, without its end.
 std::string_view takeLine(std::string_view& text);
 
+/// Takes the next word; only blanks and ends of lines separate words. Empty at the end.
+std::string_view takeWord(std::string_view& text);
+
 /// Takes the next token of a line; blanks, ':' and `separator` separate tokens. Empty at the end.
 std::string_view takeToken(std::string_view& line, char separator = ' ');
 

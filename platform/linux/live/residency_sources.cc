@@ -15,12 +15,6 @@ namespace {
 constexpr std::string_view kProcessors = "/sys/devices/system/cpu";
 constexpr Scale kTicks{10, 1};  // of 10 ms
 
-std::string lineOf(const std::string& path) {
-  TextBuffer buffer;
-  auto text = readKernelFile(path, ReadMode::Once, buffer);
-  return text ? std::string(takeLine(*text)) : std::string();
-}
-
 // The keys of the rows that begin with a number, in order.
 std::vector<std::string> numberedRows(const std::string& path, const TableForm& form) {
   TextBuffer buffer;
@@ -95,7 +89,7 @@ void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
     const std::string folder = cpu.path + "/cpuidle/state";
     std::vector<std::string> names;
     for (std::size_t i = 0; i < limits::kLiveElements; ++i) {
-      std::string name = lineOf(folder + std::to_string(i) + "/name");
+      std::string name = firstLine(folder + std::to_string(i) + "/name");
       if (name.empty()) break;
       names.push_back(std::move(name));
     }

@@ -145,10 +145,6 @@ constexpr Figure kPressure[] = {
     {"some", kPressureTotal, "pressure_some", kMicroseconds, {}, kItself},
     {"full", kPressureTotal, "pressure_full", kMicroseconds, {}, kItself},
 };
-constexpr Figure kGroupPressure[] = {
-    {"some", kPressureTotal, "pressure_some", kMicroseconds},
-    {"full", kPressureTotal, "pressure_full", kMicroseconds},
-};
 
 constexpr Figure kZramMemory[] = {
     {"", 0, "zram_data", kBytes},      {"", 1, "zram_compressed", kBytes},
@@ -164,33 +160,6 @@ constexpr Figure kZramBacking[] = {
 constexpr Figure kZramErrors[] = {
     {"", 0, "zram_failed_reads", kEvents},
     {"", 1, "zram_failed_writes", kEvents},
-};
-
-constexpr Figure kGroupCpu[] = {
-    {"usage_usec", 1, "cpu", kMicroseconds},
-    {"user_usec", 1, "cpu_user", kMicroseconds},
-    {"system_usec", 1, "cpu_system", kMicroseconds},
-    {"nr_throttled", 1, "cpu_throttles", kEvents},
-    {"throttled_usec", 1, "cpu_throttled", kMicroseconds},
-};
-constexpr Figure kGroupEvents[] = {
-    {"high", 1, "memory_high", kEvents},
-    {"max", 1, "memory_max", kEvents},
-    {"oom", 1, "memory_oom", kEvents},
-    {"oom_kill", 1, "memory_oom_kills", kEvents},
-};
-// "8:0 rbytes=1 wbytes=2 rios=3 wios=4 dbytes=5 dios=6" per disk; the figures of all disks add up.
-constexpr Figure kGroupIo[] = {
-    {"", 3, "io_read_bytes", kBytes},
-    {"", 5, "io_written_bytes", kBytes},
-    {"", 7, "io_reads", kEvents},
-    {"", 9, "io_writes", kEvents},
-};
-constexpr Attribute kGroupAttributes[] = {
-    {"memory.current", "memory", kBytes},
-    {"memory.peak", "memory_peak", kBytes},
-    {"memory.swap.current", "memory_swap", kBytes},
-    {"pids.current", "processes", kPlain},
 };
 
 constexpr std::string_view kResources[] = {"cpu", "memory", "io", "irq"};
@@ -250,14 +219,13 @@ void addMemory(const DeviceRoot& root, LiveSource& source) {
 void addPressure(const DeviceRoot& root, LiveSource& source) {
   for (const std::string_view resource : kResources) {
     const std::string name(resource);
-    addFigures(
-        root.path("/proc/pressure/" + name),
-        {.group = "Pressure",
-         .subGroup = resource,
-         .prefix = name + '.',
-         .figures = kPressure,
-         .form = kPressureForm},
-        source);
+    addFigures(root.path("/proc/pressure/" + name),
+               {.group = "Pressure",
+                .subGroup = resource,
+                .prefix = name + '.',
+                .figures = kPressure,
+                .form = kPressureForm},
+               source);
   }
 }
 
@@ -281,36 +249,6 @@ void addSwapDevices(const DeviceRoot& root, LiveSource& source) {
     add("/mm_stat", kZramMemory);
     add("/bd_stat", kZramBacking);
     add("/io_stat", kZramErrors);
-  }
-}
-
-// The top-level slices of the unified hierarchy.
-void addControlGroups(const DeviceRoot& root, LiveSource& source) {
-  const bool isUnified = exists(root.path("/sys/fs/cgroup/cgroup.controllers"));
-  const char* const folder = isUnified ? "/sys/fs/cgroup" : "/sys/fs/cgroup/unified";
-  for (const NamedDevice& slice : devicesIn(root, folder, "", "", false, source)) {
-    if (!exists(slice.path + "/cgroup.events")) continue;
-    const std::string prefix = slice.name + '.';
-    const std::string_view group = "Control Groups";
-    const auto add = [&](const std::string& file, std::span<const Figure> figures,
-                         const std::string& names, const TableForm& form = {}) {
-      addFigures(slice.path + '/' + file,
-                 {.group = group,
-                  .subGroup = slice.name,
-                  .prefix = names,
-                  .figures = figures,
-                  .form = form},
-                 source);
-    };
-    add("cpu.stat", kGroupCpu, prefix);
-    add("memory.events", kGroupEvents, prefix);
-    add("io.stat", kGroupIo, prefix, {.key = TableForm::kNoKey, .separator = '='});
-    for (const std::string_view resource : kResources) {
-      const std::string name(resource);
-      add(name + ".pressure", kGroupPressure, prefix + name + '_', kPressureForm);
-    }
-    addAttributes(slice.path, {group, slice.name, kPlain}, prefix, kGroupAttributes, Speed::Quick,
-                  source);
   }
 }
 
