@@ -11,7 +11,7 @@ namespace tavrel {
 namespace {
 
 struct File {
-  std::string path, content;
+  std::string path, content;  // a path as content makes a link to it
 };
 
 const std::string kCpu = "/sys/devices/system/cpu/";
@@ -46,8 +46,13 @@ void expectInCatalogue(const nlohmann::json& channel) {
 struct LiveDevice : TemporaryDevice {
   LiveDevice(const std::vector<File>& files) {
     std::filesystem::create_directory(path("/proc"));
-    for (const File& file : files)
-      write(file.path, file.content);
+    for (const File& file : files) {
+      if (file.content.starts_with('/')) {
+        std::filesystem::create_symlink(path(file.content), path(file.path));
+      } else {
+        write(file.path, file.content);
+      }
+    }
   }
   /// "NAME=VALUE ..." for the channels; an array's values separated by commas, a state's as
   /// "NAME:ENTRIES/RESIDENCY", with a '*' for the current state.
@@ -96,15 +101,23 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
          " 8 0 sda 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16 17\n 8 1 sda1 1 2 3 4 5 6 7 8 9 10 11\n"
          " 8 16 c/d0 1 2 3 4 5 6 7 8 9 10 11\n"},
         {"/sys/block/sda/device/x", ""},
-        {"/sys/block/c!d0/x", ""}},
+        {"/sys/block/c!d0/device/x", ""}},
        "sda.reads=1 sda.read_merges=2 sda.writes=5 sda.write_merges=6 sda.discards=12 "
        "sda.discard_merges=13 sda.flushes=16 sda.read_bytes=1536 sda.written_bytes=3584 "
        "sda.discarded_bytes=7168 sda.read_time=4 sda.write_time=8 sda.io_time=10 "
        "sda.weighted_time=11 sda.discard_time=15 sda.flush_time=17 sda.in_flight=9 c/d0.reads=1 "
        "c/d0.read_merges=2 c/d0.writes=5 c/d0.write_merges=6 c/d0.read_bytes=1536 "
        "c/d0.written_bytes=3584 c/d0.read_time=4 c/d0.write_time=8 c/d0.io_time=10 "
-       "c/d0.weighted_time=11 c/d0.in_flight=9 disks.read_bytes=1536 disks.written_bytes=3584 "
-       "disks.discarded_bytes=7168 disks.writes=5 disks.flushes=16 disks.io_time=10 "},
+       "c/d0.weighted_time=11 c/d0.in_flight=9 disks.read_bytes=3072 disks.written_bytes=7168 "
+       "disks.discarded_bytes=7168 disks.writes=10 disks.flushes=16 disks.io_time=20 "},
+      // The second disk is made of the first, which is a path to it.
+      {{{"/proc/diskstats", " 259 0 nvme0c0n1 1 2 3\n 259 1 nvme0n1 4 5 6\n"},
+        {"/sys/block/nvme0c0n1/device/x", ""},
+        {"/sys/block/nvme0n1/dev", "259:1\n"},
+        {"/sys/devices/nvme-subsys0/x", ""},
+        {"/sys/block/nvme0n1/device", "/sys/devices/nvme-subsys0"}},
+       "nvme0c0n1.reads=1 nvme0c0n1.read_merges=2 nvme0c0n1.read_bytes=1536 nvme0n1.reads=4 "
+       "nvme0n1.read_merges=5 nvme0n1.read_bytes=3072 disks.read_bytes=1536 "},
       {{{"/proc/stat",
          "cpu  9 8 7 6 5 4 3 2 1 0\ncpu2 1 2 3 4 5 6 7 8 9 10\nintr 44 1 2\n"
          "ctxt 55\nbtime 1\nprocesses 66\n"}},

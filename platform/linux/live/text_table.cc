@@ -37,6 +37,19 @@ void forEachRow(std::string_view text, const TableForm& form, const Callback& ca
   }
 }
 
+// The name of a row's folder: sysfs writes '/' in names as '!'.
+std::string entryName(std::string name) {
+  std::replace(name.begin(), name.end(), '/', '!');
+  return name;
+}
+
+// A disk that NVMe makes of several paths does not count: the paths do, each with a disk of its
+// own.
+bool isDevice(const std::string& folder) {
+  const std::string device = folder + "/device";
+  return exists(device) && !linkedName(device).starts_with("nvme-subsys");
+}
+
 void publish(const Place& place, std::string name, std::uint32_t slot, const Daily& daily,
              LiveSource& source) {
   source.addSimple(place, std::move(name), slot, daily.isItself ? kDailyCategory : kToolCategory);
@@ -100,10 +113,8 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   if (!text) return;
   std::unordered_set<std::string> allowed;
   if (!table.only.empty()) {
-    for (std::string& name : namesIn(root.path(table.only))) {
-      std::replace(name.begin(), name.end(), '!', '/');  // sysfs writes '/' as '!' in names
+    for (std::string& name : namesIn(root.path(table.only)))
       allowed.insert(std::move(name));
-    }
   }
   struct Row {
     std::string key;
@@ -120,7 +131,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
     }
     if (!table.prefix.empty() && key == table.prefix) return;  // the sum of all
     std::string name(key);
-    if (!table.only.empty() && !allowed.contains(name)) return;
+    if (!table.only.empty() && !allowed.contains(entryName(name))) return;
     if (seen.insert(name).second) rows.push_back({std::move(name), tokens});
   });
   if (isCut) source.note(format("%s: only the first %zu rows are shown", path, rows.size()));
@@ -137,7 +148,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   for (const Row& row : rows) {
     const std::string device = channelName(row.key);
     const bool isDaily = !table.daily.empty() &&
-                         exists(root.path(std::string(table.daily) + '/' + row.key + "/device"));
+                         isDevice(root.path(std::string(table.daily) + '/' + entryName(row.key)));
     for (const Column& column : table.columns) {
       const std::uint32_t at = slot++;
       // Older kernels have fewer columns.
