@@ -110,6 +110,17 @@ TEST(LiveMachineTest, ManyInterfacesHideNothing) {
   EXPECT_TRUE(text.ends_with(" if9999.rx_bytes=9999 if9999.rx_packets=2 "));
 }
 
+TEST(LiveMachineTest, AFileThatIsTooLongLosesWholeLines) {
+  DeviceServices device;
+  const std::string blanks(limits::kLiveFileBytes - 20, ' ');
+  device.write("/proc/interrupts", " CPU0\n 1: 5" + blanks + "a\nNMI: 123456\n");
+  LiveMachine live(device.root, device.log);
+  Subscribed channels(live);
+  EXPECT_EQ(channels.update(), "irq.a=5 ");
+  EXPECT_EQ(device.log.lines,
+            Lines{device.root.path("/proc/interrupts") + ": only the first 1 rows are shown"});
+}
+
 TEST(LiveMachineTest, ShowsTheInterfacesOfProcessOne) {
   DeviceServices device;
   const auto shown = [&device] {

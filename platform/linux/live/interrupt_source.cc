@@ -11,6 +11,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "base/format.h"
 #include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/live/sources.h"
@@ -93,7 +94,8 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
   auto reader = std::make_unique<InterruptReader>(width);
   std::unordered_map<std::string, std::uint32_t> slots;
   std::vector<std::pair<std::string, std::uint32_t>> names;
-  while (!text->empty() && names.size() < limits::kLiveRows) {
+  std::size_t rows = 0;
+  while (!text->empty() && rows < limits::kLiveRows) {
     std::string_view line = takeLine(*text);
     std::string key(keyOf(line));
     if (key.empty()) continue;
@@ -110,6 +112,10 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
     const auto [at, isNew] = slots.emplace(name, static_cast<std::uint32_t>(slots.size()) * width);
     if (isNew) names.emplace_back(name, at->second);
     reader->addRow(std::move(key), at->second);
+    ++rows;
+  }
+  if (buffer.isCut() || !text->empty()) {
+    source.note(format("%s: only the first %zu rows are shown", path, rows));
   }
   const std::uint32_t first = source.addTextFile(
       path, static_cast<std::uint32_t>(names.size()) * width, std::move(reader), ReadMode::ToEnd);

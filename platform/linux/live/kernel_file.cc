@@ -50,6 +50,13 @@ std::span<char> TextBuffer::roomBehind(std::size_t length) {
   return {bytes_.get() + length, size_ - length};
 }
 
+std::string_view TextBuffer::text(std::size_t length) {
+  const std::string_view all(bytes_.get(), length);
+  isCut_ = length >= limits::kLiveFileBytes;
+  // The last number may lack digits.
+  return isCut_ ? all.substr(0, all.rfind('\n') + 1) : all;
+}
+
 DescriptorBudget::DescriptorBudget() : left_(kFallbackDescriptors) {
   rlimit limit{};
   if (getrlimit(RLIMIT_NOFILE, &limit) == 0 && limit.rlim_cur != RLIM_INFINITY) {

@@ -34,15 +34,19 @@ class TextBuffer {
  public:
   /// Space for more text after the first `length` bytes, which are kept.
   std::span<char> roomBehind(std::size_t length);
-  std::string_view text(std::size_t length) const { return {bytes_.get(), length}; }
+  /// The first `length` bytes; of `limits::kLiveFileBytes` and more, only the whole lines.
+  std::string_view text(std::size_t length);
+  /// Whether the last text was cut in that way.
+  bool isCut() const { return isCut_; }
 
  private:
   std::unique_ptr<char[]> bytes_;
   std::size_t size_ = 0;
+  bool isCut_ = false;
 };
 
-/// Reads a whole file of the kernel into `buffer`, at most `limits::kLiveFileBytes`. Nothing when
-/// it cannot be opened or read. Opening never blocks.
+/// Reads a whole file of the kernel into `buffer`, or its first lines, when it has more than
+/// `limits::kLiveFileBytes`. Nothing when it cannot be opened or read. Opening never blocks.
 std::optional<std::string_view> readKernelFile(const std::string& path, ReadMode mode,
                                                TextBuffer& buffer);
 

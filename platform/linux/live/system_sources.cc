@@ -7,6 +7,7 @@
 #include <unordered_set>
 #include <vector>
 
+#include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/live/sources.h"
 #include "platform/linux/live/text_table.h"
@@ -130,6 +131,9 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
       source.addToFold("fs.root_used_percent", kPlain, LiveSource::Fold::Largest,
                        first + static_cast<std::uint32_t>(kUsedPercent));
     }
+  }
+  if (text && !text->empty()) {
+    source.note(format("only the first %zu mounted file systems are shown", seen.size()));
   }
 }
 

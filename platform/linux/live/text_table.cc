@@ -122,7 +122,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   };
   std::vector<Row> rows;
   std::unordered_set<std::string> seen;
-  bool isCut = false;
+  bool isCut = buffer.isCut();
   forEachRow(*text, table.form, [&](std::string_view key, std::size_t tokens) {
     if (!key.starts_with(table.prefix)) return;
     if (rows.size() == limits::kLiveRows) {
