@@ -131,10 +131,12 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "zram0.zram_backing_reads=8 zram0.zram_backing_writes=9 "},
       // Processor 1 is offline; handlers of interrupts matter, their numbers do not.
       {{{"/proc/interrupts",
-         "       CPU0 CPU2\n 3: 1 2 GIC 9 Level a, b c\n 4: 10 20 GIC 8 Edge b c\n"
-         " 5: 5 6 GIC 7 Edge b c\nNMI: 7 8 Non-maskable\nERR: 4\n"}},
-       "irq.c=16,-,28,-, irq.NMI=7,-,8,-, irq.ERR=4,-,-,-, "},
-      {{{"/proc/interrupts", " CPU0\n 1: -9223372036854775807 x\n 2: -1 x\n"}},
+         "       CPU0 CPU2\n 3: 1 2 GIC 9 Level     a, PCIe PME\n 4: 10 20 GIC 8 Edge      b c\n"
+         " 5: 5 6 GIC 7 Edge      b c\n 6: 3 4   IO-APIC   9-fasteoi \n"
+         " 7: 5 6 GIC 1 Edge    \nNMI: 7 8 Non-maskable\nERR: 4\n"}},
+       "irq.a,PCIe_PME=1,-,2,-, irq.b_c=15,-,26,-, irq.6=3,-,4,-, irq.7=5,-,6,-, "
+       "irq.NMI=7,-,8,-, irq.ERR=4,-,-,-, "},
+      {{{"/proc/interrupts", " CPU0\n 1: -9223372036854775807  x\n 2: -1  x\n"}},
        "irq.x=-9223372036854775807,-,-,-, "},
       {{{kCpu + "cpu0/cpuidle/state0/name", "POLL\n"},
         {kCpu + "cpu0/cpuidle/state0/time", "5\n"},

@@ -39,15 +39,18 @@ std::string_view keyOf(std::string_view& line) {
   return word.ends_with(':') ? word.substr(0, word.size() - 1) : std::string_view();
 }
 
-// The handlers at the end of a row, "i8042" or "ahci, ehci_hcd:usb1": the last word, with those
-// before it that end in a comma.
+// The handlers at the end of a row: "i8042", or "i801_smbus,PCIe_PME" for "i801_smbus, PCIe PME".
+// Two blanks precede them. A row without handlers ends in the blanks that fill its last column.
 std::string handlersIn(std::string_view line) {
+  const std::size_t gap = line.rfind("  ");
+  if (gap == std::string_view::npos || line.ends_with(' ')) return {};
+  line.remove_prefix(gap);
   std::string handlers;
-  bool isList = false;
+  bool isNext = true;  // the first word, or the first behind a comma
   for (auto word = takeWord(line); !word.empty(); word = takeWord(line)) {
-    if (!isList) handlers.clear();
+    if (!isNext) handlers += '_';
     handlers += word;
-    isList = word.ends_with(',');
+    isNext = word.ends_with(',');
   }
   return handlers;
 }
