@@ -185,6 +185,9 @@ inline constexpr std::size_t kLiveElements = 4096;
 /// one.
 inline constexpr std::size_t kLiveDevices = 1000;
 
+/// Processors that are shown live: the most for which the kernel can be built.
+inline constexpr std::size_t kLiveProcessors = 8192;
+
 /// Rows of one kernel table that are shown live, such as network interfaces.
 inline constexpr std::size_t kLiveRows = 20'000;
 

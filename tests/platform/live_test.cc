@@ -95,6 +95,22 @@ TEST(LiveMachineTest, AProcessorThatComesLaterHasNoPlace) {
   EXPECT_EQ(channels.update(), "softirq.HI=3 softirq.NET=4 ");
 }
 
+TEST(LiveMachineTest, ManyProcessorsHideNothing) {
+  DeviceServices device;
+  for (const char* const policy : {"policy", "policy1x", "policy1000", "policy1001"})
+    device.write(format("/sys/devices/system/cpu/cpufreq/%s/stats/total_trans", policy), "7\n");
+  for (int i = 0; i < 1000; ++i) {
+    std::filesystem::create_directory(
+        device.root.path(format("/sys/devices/system/cpu/cpufreq/policy%d", i)));
+  }
+  device.write("/sys/devices/system/cpu/cpufreq/policy999/stats/total_trans", "8\n");
+  device.write("/proc/uptime", "5\n");
+  LiveMachine live(device.root, device.log);
+  EXPECT_EQ(Subscribed(live).update(),
+            "boot.seconds=5 policy1000.frequency_changes=7 policy1001.frequency_changes=7 "
+            "policy999.frequency_changes=8 ");
+}
+
 TEST(LiveMachineTest, ManyInterfacesHideNothing) {
   DeviceServices device;
   std::string table = "one\ntwo\n";

@@ -197,9 +197,12 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "BAT0.cycles=210 BAT0.battery_temp=30500 battery.cycles=210 "},
       {{{"/sys/devices/system/edac/mc/mc0/ce_count", "4\n"},
         {"/sys/devices/system/edac/mc/mc0/dimm1/dimm_ce_count", "3\n"},
+        {"/sys/devices/system/edac/mc/mc0/rank4/dimm_ue_count", "6\n"},
+        {"/sys/devices/system/edac/mc/mc0/csrow0/ce_count", "9\n"},
         {"/sys/devices/system/edac/mc/mc1/ce_count", "5\n"},
         {"/sys/devices/system/edac/mc/mc2/ce_count", "unknown\n"}},
-       "mc0.corrected=4 mc0.dimm1.corrected=3 mc1.corrected=5 memory.corrected_errors=9 "},
+       "mc0.corrected=4 mc0.dimm1.corrected=3 mc0.rank4.uncorrected=6 mc1.corrected=5 "
+       "memory.corrected_errors=9 "},
       {{{"/sys/power/suspend_stats/success", "4\n"}, {"/sys/power/suspend_stats/fail", "1\n"}},
        "suspend.success=4 suspend.failed=1 "},
       {{{"/sys/fs/ext4/sda1/errors_count", "2\n"}, {"/sys/fs/ext4/features/x", "supported\n"}},

@@ -4,7 +4,6 @@
 #include <unordered_map>
 
 #include "base/format.h"
-#include "base/limits.h"
 
 namespace tavrel::live {
 namespace {
@@ -41,14 +40,17 @@ bool fitsPattern(std::string_view name, std::string_view pattern, std::string_vi
 
 std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view folder,
                                    std::string_view entry, std::string_view label,
-                                   bool alwaysWithDevice, LiveSource& source) {
+                                   bool alwaysWithDevice, LiveSource& source, std::size_t limit) {
   const std::string base = root.path(folder);
   std::vector<NamedDevice> devices;
   std::vector<std::string> entries;
   std::unordered_map<std::string, std::size_t> counts;
   for (std::string& name : namesIn(base)) {
-    if (!name.starts_with(entry)) continue;
-    if (devices.size() == limits::kLiveDevices) {
+    std::string_view number;
+    const bool isDevice =
+        entry.ends_with('*') ? fitsPattern(name, entry, number) : name.starts_with(entry);
+    if (!isDevice) continue;
+    if (devices.size() == limit) {
       source.note(format("%s: only the first %zu devices are shown", base, devices.size()));
       break;
     }
@@ -112,9 +114,8 @@ void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSour
                                              devices.alwaysWithDevice, source)) {
     addAttributes(device.path, {devices.group, device.name, kPlain}, device.name + '.',
                   devices.attributes, devices.speed, source);
-    if (devices.part.empty()) continue;
+    if (devices.partAttributes.empty()) continue;
     for (const std::string& part : namesIn(device.path)) {
-      if (!part.starts_with(devices.part)) continue;
       addAttributes(device.path + '/' + part, {devices.group, device.name, kPlain},
                     device.name + '.' + channelName(part) + '.', devices.partAttributes,
                     devices.speed, source);

@@ -5,6 +5,7 @@
 #include <span>
 #include <string_view>
 
+#include "base/limits.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/live/live_source.h"
 #include "platform/linux/live/text_table.h"
@@ -32,21 +33,22 @@ struct DeviceClass {
   bool alwaysWithDevice;
   Speed speed;
   std::span<const Attribute> attributes;
-  std::string_view part = {};  // prefix of the folders of a device's parts
-  std::span<const Attribute> partAttributes = {};
+  std::span<const Attribute> partAttributes = {};  // of folders in a device's folder
 };
 
 void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSource& source);
 
-/// The folders of devices below `folder`, and their names in channels. When there are too many to
-/// show, a note of the source says so.
+/// The folders of devices below `folder`, and their names in channels. `entry` is what the names of
+/// folders begin with; with a '*' at its end, only digits follow. When there are more than `limit`,
+/// a note of the source says so.
 struct NamedDevice {
   std::string path;
   std::string name;
 };
 std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view folder,
                                    std::string_view entry, std::string_view label,
-                                   bool alwaysWithDevice, LiveSource& source);
+                                   bool alwaysWithDevice, LiveSource& source,
+                                   std::size_t limit = limits::kLiveDevices);
 
 /// The figures of one device.
 void addAttributes(const std::string& path, const Place& place, const std::string& prefix,

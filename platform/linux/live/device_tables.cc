@@ -123,7 +123,7 @@ constexpr DeviceClass kClasses[] = {
     {"LinuxEnergy", "energy", "Energy", "/sys/class/powercap", "", "name", false, Speed::Quick,
      kPowerZone},
     {"LinuxMemoryErrors", "memory-errors", "Memory", "/sys/devices/system/edac/mc", "mc", "", false,
-     Speed::Quick, kMemoryController, "dimm", kMemoryModule},
+     Speed::Quick, kMemoryController, kMemoryModule},
     {"LinuxWakeup", "wakeup", "Wakeup", "/sys/class/wakeup", "wakeup", "name", false, Speed::Quick,
      kWakeupSource},
     {"LinuxWatchdog", "watchdog", "Boot", "/sys/class/watchdog", "watchdog", "", false,

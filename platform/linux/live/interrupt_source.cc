@@ -19,15 +19,14 @@
 namespace tavrel::live {
 namespace {
 
-constexpr std::int64_t kMostProcessors = 8192;
-
 // The numbers of the processors in the heading.
 std::vector<std::uint32_t> processorsIn(std::string_view heading) {
   std::vector<std::uint32_t> numbers;
   for (auto word = takeWord(heading); !word.empty(); word = takeWord(heading)) {
     if (!word.starts_with("CPU")) return {};
     const auto number = parseNumber(word.substr(3));
-    if (!number || *number < 0 || *number >= kMostProcessors) return {};
+    if (!number || *number < 0) return {};
+    if (static_cast<std::uint64_t>(*number) >= limits::kLiveProcessors) return {};
     numbers.push_back(static_cast<std::uint32_t>(*number));
   }
   return numbers;

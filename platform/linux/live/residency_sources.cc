@@ -85,7 +85,8 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
 }  // namespace
 
 void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
-  for (const NamedDevice& cpu : devicesIn(root, kProcessors, "cpu", "", false, source)) {
+  for (const NamedDevice& cpu :
+       devicesIn(root, kProcessors, "cpu*", "", false, source, limits::kLiveProcessors)) {
     const std::string folder = cpu.path + "/cpuidle/state";
     std::vector<std::string> names;
     for (std::size_t i = 0; i < limits::kLiveElements; ++i) {
@@ -106,7 +107,8 @@ void addCpuIdle(const DeviceRoot& root, LiveSource& source) {
 
 void addCpuFrequency(const DeviceRoot& root, LiveSource& source) {
   const std::string folder = std::string(kProcessors) + "/cpufreq";
-  for (const NamedDevice& policy : devicesIn(root, folder, "policy", "", false, source)) {
+  for (const NamedDevice& policy :
+       devicesIn(root, folder, "policy*", "", false, source, limits::kLiveProcessors)) {
     addStateTable({.times = policy.path + "/stats/time_in_state",
                    .transitions = policy.path + "/stats/trans_table",
                    .current = policy.path + "/scaling_cur_freq",
