@@ -57,6 +57,9 @@ constexpr File kFiles[] = {
     {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
     {"/sys/fs/cgroup/a.slice/cpu.stat", ""},
     {"/sys/fs/cgroup/a.slice/memory.current", ""},
+    {"/sys/fs/cgroup/a.slice/io.stat", ""},
+    {"/sys/block/sda/dev", "8:0\n"},
+    {"/sys/block/sda/device/x", "x"},
 };
 
 // The size in bytes of the largest channel, and the number of channels.
