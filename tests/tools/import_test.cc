@@ -361,8 +361,11 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
                "titles\ntitles\n    lo: 9 0 0 0 0 0 0 0 9 0\n  eth0: 2048 0 0 0 0 0 0 0 4096 0\n"
                " eth1: garbage\n");
   device.write("/proc/diskstats",
-               "8 0 sda 1 1 200 1 1 1 400 1\n7 0 loop0 1 1 9 1 1 1 9 1\nshort\n");
-  device.write("/sys/block/sda/device/x", "");
+               "8 0 cciss/sda 1 1 200 1 1 1 400 1\n7 0 loop0 1 1 9 1 1 1 9 1\nshort\n"
+               "259 0 nvme0n1 1 1 1 1 1 1 1 1\n");
+  device.write("/sys/block/cciss!sda/device/x", "");
+  device.write("/sys/block/nvme0n1/nvme-subsys0/x", "");
+  std::filesystem::create_symlink("nvme-subsys0", device.path("/sys/block/nvme0n1/device"));
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
   device.write("/sys/class/thermal/thermal_zone1/temp", "30000\n");
   SlowPace pace([&] {
@@ -371,7 +374,9 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
     device.write("/proc/net/dev",
                  "titles\ntitles\n    lo: 99 0 0 0 0 0 0 0 99 0\n"
                  "  eth0: 5120 0 0 0 0 0 0 0 9216 0\n eth1: garbage\n");
-    device.write("/proc/diskstats", "8 0 sda 1 1 214 1 1 1 418 1\n7 0 loop0 1 1 99 1 1 1 99 1\n");
+    device.write("/proc/diskstats",
+                 "8 0 cciss/sda 1 1 214 1 1 1 418 1\n7 0 loop0 1 1 99 1 1 1 99 1\n"
+                 "259 0 nvme0n1 1 1 99 1 1 1 99 1\n");
   });
   std::istringstream in;
   std::ostringstream out, error;

@@ -12,6 +12,8 @@
 #include <unistd.h>
 #include <utility>
 
+#include "platform/linux/live/kernel_file.h"
+
 namespace tavrel {
 namespace {
 
@@ -148,8 +150,10 @@ std::string_view MachineSources::contentOf(std::string_view devicePath) {
 bool MachineSources::isDisk(std::string_view name) {
   const auto found = disks_.find(name);
   if (found != disks_.end()) return found->second;
-  const std::string device = "/sys/block/" + std::string(name) + "/device";
-  const bool is = !isVirtualDisk(name) && access(root_.pathOrMachine(device).c_str(), F_OK) == 0;
+  std::string entry(name);
+  std::ranges::replace(entry, '/', '!');
+  const bool is =
+      !isVirtualDisk(name) && live::isDiskDevice(root_.pathOrMachine("/sys/block/" + entry));
   disks_.emplace(name, is);
   return is;
 }

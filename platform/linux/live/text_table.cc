@@ -43,13 +43,6 @@ std::string entryName(std::string name) {
   return name;
 }
 
-// A disk that NVMe makes of several paths does not count: the paths do, each with a disk of its
-// own.
-bool isDevice(const std::string& folder) {
-  const std::string device = folder + "/device";
-  return exists(device) && !linkedName(device).starts_with("nvme-subsys");
-}
-
 void publish(const Place& place, std::string name, std::uint32_t slot, const Daily& daily,
              LiveSource& source) {
   source.addSimple(place, std::move(name), slot, daily.isItself ? kDailyCategory : kToolCategory);
@@ -147,8 +140,9 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
                          std::move(reader), ReadMode::ToEnd);
   for (const Row& row : rows) {
     const std::string device = channelName(row.key);
-    const bool isDaily = !table.daily.empty() &&
-                         isDevice(root.path(std::string(table.daily) + '/' + entryName(row.key)));
+    const bool isDaily =
+        !table.daily.empty() &&
+        isDiskDevice(root.path(std::string(table.daily) + '/' + entryName(row.key)));
     for (const Column& column : table.columns) {
       const std::uint32_t at = slot++;
       // Older kernels have fewer columns.
