@@ -68,13 +68,13 @@ void route(fuzz::Tree& tree, fuzz::Input& input) {
   FileSystem files;
   const std::string first = input.part();
   const std::string second = input.part();
-  tree.write("/proc/net/route", first);
-  tree.write("/proc/net/ipv6_route", second);
+  tree.write("/proc/self/net/route", first);
+  tree.write("/proc/self/net/ipv6_route", second);
   upload::Configuration configuration;
-  const std::string reason = upload::reasonToWait(tree.root, files, configuration);
+  const std::string reason = *upload::reasonToWait(tree.root, files, configuration);
   require(reason.empty() || reason == "there is no default route");
   configuration.meteredInterfaces = {"*"};
-  const std::string metered = upload::reasonToWait(tree.root, files, configuration);
+  const std::string metered = *upload::reasonToWait(tree.root, files, configuration);
   if (!reason.empty()) return require(metered == reason);
   constexpr std::string_view kBeginning = "the network is metered (";
   require(metered.starts_with(kBeginning));

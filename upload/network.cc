@@ -25,8 +25,9 @@ struct Table {
   std::size_t interface, destination, prefix, flags, metric;
   int metricBase;
 };
-constexpr Table kTables[] = {{"/proc/net/route", 11, 0, 1, 7, 3, 6, 10},
-                             {"/proc/net/ipv6_route", 10, 9, 0, 1, 8, 5, 16}};
+// Not below /proc/net, which a service that sees only processes (ProcSubset=pid) does not have.
+constexpr Table kTables[] = {{"/proc/self/net/route", 11, 0, 1, 7, 3, 6, 10},
+                             {"/proc/self/net/ipv6_route", 10, 9, 0, 1, 8, 5, 16}};
 
 std::vector<std::string_view> columnsOf(std::string_view line) {
   std::vector<std::string_view> columns;
@@ -81,14 +82,20 @@ bool isThisMachine(std::string_view host) {
 
 }  // namespace
 
-std::string reasonToWait(const DeviceRoot& root, FileSystem& files,
-                         const Configuration& configuration) {
-  if (isThisMachine(configuration.host)) return {};
+Expected<std::string> reasonToWait(const DeviceRoot& root, FileSystem& files,
+                                   const Configuration& configuration) {
+  const bool mayBeMetered = !configuration.meteredInterfaces.empty();
+  if (isThisMachine(configuration.host) || !(configuration.needsDefaultRoute || mayBeMetered)) {
+    return std::string();
+  }
+  bool hasTable = false;
   bool isRouted = false;
   for (const Table& table : kTables) {
     const auto text = files.readIfPresent(root.pathOrMachine(table.path), limits::kLiveFileBytes);
+    if (!text) return text.error();
     // A kernel without IPv6 has no such table.
-    if (!text || !*text) continue;
+    if (!*text) continue;
+    hasTable = true;
     const std::string interface = preferredInterface(table, **text);
     if (interface.empty()) continue;
     isRouted = true;
@@ -97,8 +104,12 @@ std::string reasonToWait(const DeviceRoot& root, FileSystem& files,
         return format("the network is metered (%s)", interface);
     }
   }
-  if (!isRouted && configuration.needsDefaultRoute) return "there is no default route";
-  return {};
+  if (!hasTable) {
+    return Error{format("cannot find a route: neither %s nor %s exists; mount /proc",
+                        kTables[0].path, kTables[1].path)};
+  }
+  if (!isRouted && configuration.needsDefaultRoute) return std::string("there is no default route");
+  return std::string();
 }
 
 }  // namespace tavrel::upload

@@ -152,9 +152,13 @@ Outcome Uploader::runLocked(bool atOnce) {
                       isoDateText(*state_.nextAttempt));
     return Outcome::Waits;
   }
-  if (const std::string reason = reasonToWait(services_.root, services_.files, configuration_);
-      !reason.empty()) {
-    services_.log.log(LogLevel::Info, "logs wait: %s", reason);
+  const auto reason = reasonToWait(services_.root, services_.files, configuration_);
+  if (!reason) {
+    complain(format("logs wait: %s", reason.error().message));
+    return Outcome::Waits;
+  }
+  if (!reason->empty()) {
+    services_.log.log(LogLevel::Info, "logs wait: %s", *reason);
     return Outcome::Waits;
   }
 

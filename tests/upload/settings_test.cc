@@ -61,6 +61,14 @@ TEST(Upload, HasADeadlineForEverything) {
   EXPECT_EQ(device.names().size(), 2U);
 }
 
+struct NoTables final : FileSystem {
+  int openFile(const char* path, int flags, mode_t mode) override {
+    if (!std::string_view(path).ends_with("route")) return FileSystem::openFile(path, flags, mode);
+    errno = ENOENT;
+    return -1;
+  }
+};
+
 TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   const auto row = [](const char* name, const char* to, const char* flags, int metric) {
     return format("%s\t%s\t0100A8C0\t%s\t0\t0\t%d\t00000000\t0\t0\t0\n", name, to, flags, metric);
@@ -86,11 +94,11 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   device.configuration.meteredInterfaces = {"ppp0", "wwan*"};
   const auto reason = [&](const char* host) {
     device.configuration.host = host;
-    return upload::reasonToWait(device.root, device.files, device.configuration);
+    return *upload::reasonToWait(device.root, device.files, device.configuration);
   };
   for (const auto& [four, six, expected] : cases) {
-    device.write("/proc/net/route", four);
-    device.write("/proc/net/ipv6_route", six);
+    device.write("/proc/self/net/route", four);
+    device.write("/proc/self/net/ipv6_route", six);
     EXPECT_EQ(reason("logs.example.com"), expected);
     for (const char* host : {"127.0.0.1", "localhost", "::1"})
       EXPECT_EQ(reason(host), "") << host;
@@ -99,6 +107,11 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   EXPECT_EQ(device.run(), Outcome::Waits);
   EXPECT_EQ(device.log.lines, Lines{"logs wait: there is no default route"});
   EXPECT_FALSE(fs::exists(device.root.path(upload::kStatePath)));
+  NoTables noTables;
+  EXPECT_EQ(device.run(false, noTables), Outcome::Waits);
+  EXPECT_EQ(device.state().failure,
+            "logs wait: cannot find a route: neither /proc/self/net/route nor "
+            "/proc/self/net/ipv6_route exists; mount /proc");
 }
 
 TEST(Upload, PausesLongerFromFailureToFailure) {

@@ -61,6 +61,7 @@ uncover() {
 }
 
 # The first upload takes everything that has waited since the power cut.
+connect
 nginx
 systemctl stop tavrel-fold.path tavrel-upload.path tavrel-sampler.service
 expect "units with their folders" "$all_work" "$(outcomes)"

@@ -15,7 +15,7 @@ certificate authority /CN=authority
 by="-CA $server/authority.crt -CAkey $server/authority.key
   -addext basicConstraints=critical,CA:FALSE"
 # shellcheck disable=SC2086
-certificate server /CN=localhost $by -addext subjectAltName=DNS:localhost
+certificate server /CN=logs.example.com $by -addext subjectAltName=DNS:logs.example.com
 # shellcheck disable=SC2086
 certificate device /CN=device-7 $by
 cp "$server/authority.crt" "$server/devices-authority.crt"
@@ -23,6 +23,8 @@ cp "$server/authority.crt" /etc/credstore/tavrel-upload.authority
 cp "$server/device.crt" /etc/credstore/tavrel-upload.certificate
 cp "$server/device.key" /etc/credstore/tavrel-upload.key
 cp "$here/../../docs/examples/upload/nginx.conf" /etc/nginx/conf.d/tavrel-upload.conf
+echo "$address logs.example.com" >>/etc/hosts
+connect
 nginx
 
 cat >/etc/tavrel/upload.plist <<'PLIST'
@@ -30,9 +32,7 @@ cat >/etc/tavrel/upload.plist <<'PLIST'
 <plist version="1.0">
 <dict>
 	<key>URL</key>
-	<string>https://localhost/logs</string>
-	<key>NeedsDefaultRoute</key>
-	<false/>
+	<string>https://logs.example.com/logs</string>
 </dict>
 </plist>
 PLIST
