@@ -228,11 +228,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
 
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
   const std::chrono::milliseconds left = timeLeft();
-  if (left <= std::chrono::milliseconds(0)) {
-    services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
-                      std::int64_t{configuration_.run.count()});
-    return Step::Stop;
-  }
+  if (left <= std::chrono::milliseconds(0)) return stopAtLimit();
   tried_ = true;
   const auto answer =
       connection_->put(configuration_.url + "/" + log.name + ".log", headers, packed.content,
@@ -245,7 +241,15 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
                     answer.error().message));
     return Step::Misconfigured;
   }
+  // Only a log for which a whole run is too short has failed.
+  if (timeLeft() <= std::chrono::milliseconds(0) && sent_ + refused_ > 0) return stopAtLimit();
   return failToSend(log, answer.error().message);
+}
+
+Uploader::Step Uploader::stopAtLimit() {
+  services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
+                    std::int64_t{configuration_.run.count()});
+  return Step::Stop;
 }
 
 // A log whose metadata is unreadable is sent without metadata.

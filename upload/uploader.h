@@ -76,6 +76,7 @@ class Uploader {
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
   Step confirm(const WaitingLog& log, const PackedLog& packed);
   Step giveUp(const WaitingLog& log, long status);
+  Step stopAtLimit();
   Step failToSend(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
   Step failToMove(const Error& error);
   /// Notes the failure and the time of the next attempt.

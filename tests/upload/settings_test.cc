@@ -42,6 +42,15 @@ TEST(Upload, HasADeadlineForEverything) {
     EXPECT_TRUE(device.log.says("Operation timed out after "));
     *limit = seconds(600);
   }
+  device.add(nameOf(2));
+  int requests = 0;
+  const auto slowly = [&](const std::string&) { return ++requests == 1 ? kOk : "H"; };
+  device.configuration.run = seconds(1);
+  device.log.lines.clear();
+  EXPECT_EQ(device.runAgainst(ScriptedServer(slowly), true), Outcome::Waits);
+  EXPECT_EQ(device.log.lines, (Lines{"logs wait: a run takes at most 1 seconds",
+                                     "logs sent: 1, refused by the server: 0"}));
+  EXPECT_EQ(device.state().failedTransfers, 0) << "a run that sent something ends at its limit";
   device.configuration.run = seconds(0);
   EXPECT_EQ(device.run(true), Outcome::Waits);
   EXPECT_EQ(device.log.lines.back(), "logs wait: a run takes at most 0 seconds");
