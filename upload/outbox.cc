@@ -92,21 +92,30 @@ Status Outbox::remove(std::string_view name) {
   return removeFrom(kOutbox, name);
 }
 
-Expected<std::size_t> Outbox::removeAll() {
-  if (!FileSystem::status(folder_)) return std::size_t{0};
+Status Outbox::removeAll(std::size_t& count) {
+  if (!FileSystem::status(folder_)) return Done{};
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return lock.error();
-  std::size_t count = 0;
+  Status outcome = Done{};
+  const auto keepFirst = [&](const Error& error) {
+    if (outcome) outcome = error;
+  };
   for (const std::string_view place : {kPending, kOutbox}) {
     std::vector<std::string> orphans;
     const auto logs = logsIn(place, orphans);
-    if (!logs) return logs.error();
+    if (!logs) {
+      keepFirst(logs.error());
+      continue;
+    }
     for (const WaitingLog& log : *logs) {
-      if (Status removed = removeFrom(place, log.name); !removed) return removed.error();
-      ++count;
+      if (Status removed = removeFrom(place, log.name)) {
+        ++count;
+      } else {
+        keepFirst(removed.error());
+      }
     }
   }
-  return count;
+  return outcome;
 }
 
 Status Outbox::move(std::string_view name, std::string_view from, std::string_view to) {

@@ -45,8 +45,9 @@ class Outbox {
   /// at most `limits::kRefusedBytes` in total.
   Status refuse(std::string_view name);
 
-  /// Removes all waiting logs, also those in pending/, and returns their number.
-  Expected<std::size_t> removeAll();
+  /// Removes all waiting logs, also those in pending/, and adds their number to `count`. A log that
+  /// cannot be removed does not stop the others; the first failure is returned.
+  Status removeAll(std::size_t& count);
 
  private:
   std::string path(std::string_view place, std::string_view name, std::string_view ending) const;

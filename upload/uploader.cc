@@ -367,17 +367,15 @@ void Uploader::fail(std::string line, std::int64_t serverWish) {
 }
 
 Outcome Uploader::removeWaiting() {
-  const auto removed = outbox_.removeAll();
-  if (!removed) {
-    complain(removed.error().message);
-    return Outcome::Failed;
-  }
-  if (*removed > 0) {
+  std::size_t count = 0;
+  const Status removed = outbox_.removeAll(count);
+  if (!removed) complain(removed.error().message);
+  if (count > 0) {
     services_.log.log(LogLevel::Default,
                       "the permission to send logs was withdrawn; waiting logs removed: %llu",
-                      std::uint64_t{*removed});
+                      std::uint64_t{count});
   }
-  return Outcome::Done;
+  return removed ? Outcome::Done : Outcome::Failed;
 }
 
 }  // namespace tavrel::upload

@@ -210,6 +210,16 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
     EXPECT_EQ(requests, 1);
     EXPECT_EQ(device.names("pending").size(), isWithdrawn ? 0U : 2U);
   }
+  Device obstructed;
+  obstructed.permit("<false/>");
+  obstructed.write(kSubmission + "pending/a.log/x", "");
+  obstructed.add(nameOf(1));
+  EXPECT_EQ(obstructed.run(), Outcome::Failed);
+  EXPECT_EQ(obstructed.names(), Lines{});
+  EXPECT_EQ(obstructed.log.lines,
+            (Lines{"cannot use " + obstructed.root.path(kSubmission + "pending/a.log") +
+                       ": it is a folder; move it away",
+                   "the permission to send logs was withdrawn; waiting logs removed: 1"}));
   const std::tuple<const char*, const char*, std::size_t, std::string> changes[] = {
       {"<false/>", "", 0, "the permission to send logs was withdrawn; waiting logs removed: 1"},
       {"<true/>", "<integer>20785</integer>", 2,

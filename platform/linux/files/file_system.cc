@@ -247,8 +247,9 @@ Status FileSystem::rename(const std::string& from, const std::string& to) {
 }
 
 Status FileSystem::remove(const std::string& path) {
-  if (removeFile(path.c_str()) != 0 && errno != ENOENT) return systemError("remove", path);
-  return Done{};
+  if (removeFile(path.c_str()) == 0 || errno == ENOENT) return Done{};
+  if (errno == EISDIR) return notRegular(path, S_IFDIR);
+  return systemError("remove", path);
 }
 
 Status FileSystem::makeFolders(const std::string& path) {
