@@ -269,6 +269,8 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
   addNvme("nvme0", "S1");
   write("/sys/block/mmcblk0/device/type", "MMC\n");
   write("/sys/block/mmcblk0/device/life_time", "0x02 0x01\n");
+  for (const char* idle : {"/sys/block/mmcblk0/device", "/sys/class/mtd/mtd0"})
+    write(std::string(idle) + "/power/runtime_status", "suspended\n");
   write("/sys/class/mtd/mtd0/ecc_failures", "2\n");
   write("/sys/class/mtd/mtd0/corrected_bits", "-\n");
   write("/sys/class/ubi/ubi0/max_ec", "9\n");

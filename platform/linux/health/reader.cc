@@ -18,6 +18,22 @@
 namespace tavrel::health {
 namespace {
 
+// Whether a reading would wake a drive that must go on sleeping. The kernel suspends cards whenever
+// they are idle, so any write wakes them; figures of raw flash are in the kernel's memory.
+bool isLeftAsleep(const Drive& drive) {
+  switch (drive.kind) {
+    case DriveKind::Nvme:
+    case DriveKind::Ata:
+    case DriveKind::Ufs:
+      return isAsleep(drive.folder);
+    case DriveKind::Emmc:
+    case DriveKind::Mtd:
+    case DriveKind::Ubi:
+      break;
+  }
+  return false;
+}
+
 // Identifies a drive from one reading to the next. A digest, so that the memory file contains no
 // serial number.
 std::string identityOf(const Drive& drive) {
@@ -94,7 +110,7 @@ void HealthReader::readNvme(const Drive& drive, Memory& memory, Reading& reading
 }
 
 Reading HealthReader::readDrive(const Drive& drive, Memory& memory, bool& isDriveAsleep) {
-  isDriveAsleep = isAsleep(drive.folder);
+  isDriveAsleep = isLeftAsleep(drive);
   Reading reading = emptyReading(drive);
   if (isDriveAsleep) return reading;
   if (drive.kind == DriveKind::Nvme) {
