@@ -161,7 +161,8 @@ TEST(HealthTest, FlashLife) {
 TEST(HealthTest, Growth) {
   struct Step {
     std::string boot;
-    std::int64_t runDay, written, ecc;  // bytes, failures since attach
+    std::optional<std::int64_t> runDay;
+    std::int64_t written, ecc;  // bytes, failures since attach
     Values growth;
   };
   const std::vector<std::pair<std::string, std::vector<Step>>> cases = {
@@ -171,6 +172,10 @@ TEST(HealthTest, Growth) {
         {"a", 2, 18, 1, {{"written", 3}, {"ecc_failures", 0}}},
         {"a", 2, 20, 4, {{"written", 5}, {"ecc_failures", 3}}},
         {"a", 3, 21, 4, {{"written", 1}, {"ecc_failures", 0}}}}},
+      {"the first run of a device counts as well",
+       {{"a", std::nullopt, 10, 0, {}},
+        {"a", std::nullopt, 15, 0, {}},
+        {"a", 1, 18, 1, {{"written", 3}, {"ecc_failures", 1}}}}},
       {"a new boot begins the kernel's counter at 0, not the drive's",
        {{"a", 1, 10, 5, {}},
         {"b", 2, 12, 7, {{"written", 2}, {"ecc_failures", 7}}},

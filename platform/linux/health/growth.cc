@@ -43,7 +43,7 @@ Counters decodeCounters(const plist::Dictionary& dictionary) {
 }  // namespace
 
 Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& moment) {
-  const bool runPassed = memory.runDay && moment.runDay && *memory.runDay != *moment.runDay;
+  const bool runPassed = moment.runDay && memory.runDay != moment.runDay;
   if (runPassed) {
     memory.grown.clear();
     memory.lost.clear();
