@@ -23,6 +23,11 @@ constexpr std::uint32_t kAllNamespaces = 0xFFFFFFFF;
 constexpr std::uint32_t kRetainEvent = 1U << 15;
 constexpr std::uint32_t kMilliseconds = 5'000;
 
+// Status codes with their type, without the bits that say what to do.
+constexpr int kStatusCode = 0x7FF;
+constexpr int kInvalidField = 0x002;
+constexpr int kInvalidLogPage = 0x109;
+
 constexpr std::uint32_t kSendExtCsd = 8;
 // Response R1 (present, with checksum and command index) on both buses, and data that follows.
 constexpr std::uint32_t kResponseWithData = 1U << 0 | 1U << 2 | 1U << 4 | 1U << 5 | 1U << 7;
@@ -58,6 +63,8 @@ Expected<DeviceCommands::Bytes> LinuxDeviceCommands::nvmeLog(const std::string& 
   command.timeout_ms = kMilliseconds;
   const int status = ioctl(device->get(), NVME_IOCTL_ADMIN_CMD, &command);
   if (status < 0) return systemError(format("read log %02Xh of", page), path);
+  const int code = status & kStatusCode;
+  if (status > 0 && (code == kInvalidField || code == kInvalidLogPage)) return Bytes();
   if (status > 0) {
     return Error{format("cannot read log %02Xh of %s: NVMe status 0x%04X", page, path, status)};
   }

@@ -14,7 +14,8 @@ class DeviceCommands {
   using Bytes = std::vector<std::byte>;
   virtual ~DeviceCommands() = default;
 
-  /// A log page of the controller whose device file is `path`. Needs CAP_SYS_ADMIN.
+  /// A log page of the controller whose device file is `path`; empty when the drive answers that it
+  /// has no such page. Needs CAP_SYS_ADMIN.
   virtual Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) = 0;
   /// The EXT_CSD register. `path` names the whole card, not a partition. Needs CAP_SYS_RAWIO.
   virtual Expected<Bytes> extCsd(const std::string& path) = 0;

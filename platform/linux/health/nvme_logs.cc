@@ -237,6 +237,7 @@ constexpr std::array<std::uint8_t, 16> kOcpGuid = {0xC5, 0xAF, 0x10, 0x28, 0xEA,
 constexpr std::int64_t kZeroCelsius = 273'150;  // thousandths of a Kelvin
 
 Status checkPage(ByteSpan page, std::string_view name) {
+  if (page.empty()) return Error{format("the drive has no log %s", name)};
   if (page.size() != kNvmeLogBytes) {
     return Error{format("log %s has %zu bytes instead of %zu", name, page.size(), kNvmeLogBytes)};
   }

@@ -101,7 +101,8 @@ void HealthReader::readNvme(const Drive& drive, Memory& memory, Reading& reading
   // A drive that lacks the log counts each request for it as an error.
   if (known != memory.hasOcpLog.end() && !known->second) return;
   const auto ocpPage = commands_.nvmeLog(drive.deviceFile, kNvmeOcpLog);
-  const auto ocp = ocpPage ? nvmeOcpFigures(*ocpPage) : ocpPage.error();
+  if (!ocpPage) return;  // no answer
+  const auto ocp = nvmeOcpFigures(*ocpPage);
   if (known == memory.hasOcpLog.end()) memory.hasOcpLog[key] = static_cast<bool>(ocp);
   if (!ocp) return;
   reading.figures.insert(reading.figures.end(), ocp->begin(), ocp->end());
