@@ -302,7 +302,7 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
 
 TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
   addNvme("nvme0", "S1");
-  addNvme("nvme1", "S2");
+  addNvme("nvme1", "S1");
   answers.ocp.reset();
   ASSERT_TRUE(readAll(900));
   answers.ocp = Bytes{};
@@ -320,6 +320,8 @@ TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
   EXPECT_EQ(figures["throttle_events"], 255);
   EXPECT_FALSE(figures.contains("bad_user_blocks"));
   EXPECT_FALSE(valuesOf(readings()["nvme0"].figures).contains("media_written"));
+  const std::string memory = contentOf(root.path(kMemoryFile));
+  EXPECT_EQ(decodeMemory(asBytes(memory))->drives.size(), 2U) << "drives of one serial number";
 }
 
 TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {

@@ -1,6 +1,7 @@
 #include "platform/linux/health/reader.h"
 
 #include <algorithm>
+#include <set>
 #include <sys/stat.h>
 
 #include "base/format.h"
@@ -202,7 +203,11 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   const Moment moment{nowSeconds, bootIDOf(root_), runDay ? *runDay : std::nullopt};
   Memory memory = loadMemory();
   bool isDone = static_cast<bool>(runDay);
+  std::set<std::string> identities;
   for (const Drive& drive : *drives) {
+    std::string identity = identityOf(drive);
+    // Only its name tells a drive from another of the same serial number.
+    if (!identities.insert(identity).second) identity += '/' + drive.name;
     bool isDriveAsleep = false;
     Reading reading = readDrive(drive, memory, isDriveAsleep);
     if (isDriveAsleep) continue;
@@ -211,7 +216,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
     if (!reading.error.empty()) {
       log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
     } else if (runDay) {
-      reading.growth = takeGrowth(memory.drives[identityOf(drive)], reading.figures, moment);
+      reading.growth = takeGrowth(memory.drives[identity], reading.figures, moment);
       // Store the memory before anybody sees the growth, or the next run would count it again: the
       // next drive may never answer.
       if (!keep(memory)) {
