@@ -84,16 +84,20 @@ TEST(HealthTest, RefusesShortAndLyingLogs) {
 TEST(HealthTest, OcpFieldsOfALaterVersion) {
   Bytes page = ocpPage();
   put(page, 104, {9});
+  put(page, 128, {0x2C, 0x01});
   put(page, 160, {3});
   put(page, 192, {0, 1});
   const auto first = valuesOf(*nvmeOcpFigures(page));
   EXPECT_EQ(first.at("pcie_errors"), 9);
+  EXPECT_EQ(first.at("capacitor_pct"), 300);
   EXPECT_FALSE(first.contains("backup_power_starts"));
+  put(page, 128, {255, 255});
   put(page, 494, {2});
   const auto second = valuesOf(*nvmeOcpFigures(page));
   EXPECT_EQ(second.at("backup_power_starts"), 3);
   EXPECT_EQ(second.at("link_retrains"), 256);
   EXPECT_FALSE(second.contains("endurance"));  // not reported
+  EXPECT_FALSE(second.contains("capacitor_pct"));
 }
 
 // The drive's answer in the library's form: pieces of a tag and a big-endian size.
