@@ -116,18 +116,30 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
 }
 
 TEST_F(PageTest, EstimatesHowLongDrivesLast) {
-  import("scalar\t" + std::to_string(today() - 11) +
-         "\tcom.norvane.ioreport.nvme3.used_pct\t40\n"
-         "scalar\tyesterday\tcom.norvane.ioreport.nvme3.used_pct\t50\n");
+  // The last three had a predecessor of the same name.
+  const std::tuple<const char*, int, int> wear[] = {
+      {"nvme3", 11, 40}, {"nvme3", 1, 50}, {"nvme4", 11, 10}, {"nvme4", 10, 59}, {"nvme4", 1, 60},
+      {"nvme5", 11, 20}, {"nvme5", 10, 2}, {"nvme5", 1, 24},  {"nvme6", 11, 40}, {"nvme6", 1, 50}};
+  std::string rows;
+  for (const auto& [drive, ago, percent] : wear)
+    rows +=
+        format("scalar\t%d\tcom.norvane.ioreport.%s.used_pct\t%d\n", today() - ago, drive, percent);
+  import(rows);
   writeDrive("nvme0", "nvme", R"("used_pct": 10, "power_on_hours": 2400)");
   writeDrive("nvme1", "nvme", R"("used_pct": 100)");
   writeDrive("nvme2", "nvme", R"("used_pct": 0, "power_on_hours": 9)");
   writeDrive("nvme3", "nvme", R"("used_pct": 50, "power_on_hours": 9)");
+  writeDrive("nvme4", "nvme", R"("used_pct": 60, "power_on_hours": 2304)");
+  writeDrive("nvme5", "nvme", R"("used_pct": 24, "power_on_hours": 720)");
+  writeDrive("nvme6", "nvme", R"("used_pct": 3, "power_on_hours": 720)");
   writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
   writeDrive("sda", "ata", R"("smart_good": 0)");
   expect(textOf(), {"About 2.5 years of operation at the pace of its life so far",
                     "Its rated life is used up", "Not known yet: no wear so far",
                     "About 50 days at the pace of the days on this page",
+                    "About 64 days of operation at the pace of its life so far",
+                    "About 95 days of operation at the pace of its life so far",
+                    "About 2.7 years of operation at the pace of its life so far",
                     "Not known yet: its wear has not changed on these days",
                     "Not known: the drive reports no wear", "failing, SMART status is failing"});
 }

@@ -2,6 +2,7 @@
 #include <algorithm>
 #include <cmath>
 #include <optional>
+#include <utility>
 
 #include "base/format.h"
 #include "base/quantity_text.h"
@@ -43,6 +44,25 @@ std::optional<double> daysLeft(double percentUsed, double inDays, double percent
   return std::max(100 - percentNow, 0.0) * inDays / percentUsed;
 }
 
+// The kernel gives the name of a drive to its replacement. Between two values of one drive, wear
+// does not shrink, and does not grow by more than a step of the figure or a pace that would wear
+// out the drive in weeks.
+bool isOfOneDrive(const ByDay<std::int64_t>& days, const Disk& disk, const Wear& wear) {
+  constexpr double kMostPerDay = 5;
+  constexpr double kSecondsPerDay = 86'400;
+  const double step = wear.figure == "used_pct" ? 1 : 10;
+  double lastDay = days.front().first;
+  auto lastPercent = static_cast<double>(days.front().second);
+  const auto follows = [&](double day, std::int64_t value) {
+    const auto percent = static_cast<double>(value);
+    const double grown = percent - std::exchange(lastPercent, percent);
+    const double inDays = day - std::exchange(lastDay, day);
+    return grown >= 0 && grown <= std::max(step, kMostPerDay * inDays);
+  };
+  return std::ranges::all_of(days, [&](const auto& at) { return follows(at.first, at.second); }) &&
+         follows(static_cast<double>(disk.reading.time) / kSecondsPerDay, wear.percent);
+}
+
 // Extrapolates the figure that the daily run stored, provided it grew by at least `leastGrowth`
 // percent over the days of the page.
 std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear,
@@ -50,6 +70,7 @@ std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, 
   const auto known = scene.recorded.scalars.find(
       format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
   if (known == scene.recorded.scalars.end() || known->second.days.size() < 2) return std::nullopt;
+  if (!isOfOneDrive(known->second.days, disk, wear)) return std::nullopt;
   const auto& [firstDay, first] = known->second.days.front();
   const auto& [lastDay, last] = known->second.days.back();
   const double growth = static_cast<double>(last) - static_cast<double>(first);
