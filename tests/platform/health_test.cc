@@ -67,6 +67,7 @@ TEST(HealthTest, NvmeSmartLog) {
 }
 
 TEST(HealthTest, RefusesShortAndLyingLogs) {
+  EXPECT_EQ(nvmeSmartFigures(Bytes()).error().message, "the drive has no log 02h");
   EXPECT_EQ(nvmeSmartFigures(Bytes(511)).error().message, "log 02h has 511 bytes instead of 512");
   EXPECT_EQ(nvmeSmartFigures(Bytes(512)).error().message, "log 02h is blank");
   EXPECT_EQ(nvmeSmartFigures(Bytes(512, std::byte{255})).error().message, "log 02h is blank");
