@@ -112,6 +112,36 @@ TEST(EngineFaults, LeavesFilesAloneThatAreNotItsOwn) {
       "or load the logs into a new file");
 }
 
+TEST(EngineFaults, TakesEachNameForThatOfAFile) {
+  const TemporaryRoot root;
+  const std::filesystem::path before = std::filesystem::current_path();
+  std::filesystem::current_path(root.root.path("/"));
+  for (const char* const name : {":memory:", "file:fleet.db"}) {
+    std::size_t rows = 0;
+    EXPECT_EQ(failureOf([&] {
+                appendInPortions(name, records(8));
+                rows = rowsIn(*openEngine(name, OpenMode::kRead)->reader()).size();
+              }),
+              "no failure");
+    EXPECT_EQ(rows, 32u) << name;
+  }
+  std::filesystem::current_path(before);
+}
+
+TEST(EngineFaults, TellsReadersWhatTheyNeed) {
+  if (geteuid() != 0) GTEST_SKIP() << "may not become another user";
+  const TemporaryRoot root;
+  const std::string path = root.root.path("/fleet.db");
+  appendInPortions(path, records(8));
+  std::filesystem::permissions(root.root.path("/"), std::filesystem::perms(0755));
+  ASSERT_EQ(seteuid(65534), 0);
+  const std::string failure = openingFailure(path, OpenMode::kRead);
+  ASSERT_EQ(seteuid(0), 0);
+  EXPECT_EQ(failure, path +
+                         ": attempt to write a readonly database: readers must be able to write "
+                         "in its folder too; or query a copy");
+}
+
 TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
   const TemporaryRoot root;
   root.write("/long", std::string(5000, 'x'));

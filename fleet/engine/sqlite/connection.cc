@@ -12,7 +12,7 @@ namespace {
 
 constexpr int kBusyMilliseconds = 60'000;
 
-const char* adviceFor(int code) {
+const char* adviceFor(int code, bool writes) {
   switch (code & 0xFF) {
     case SQLITE_BUSY:
     case SQLITE_LOCKED:
@@ -23,8 +23,10 @@ const char* adviceFor(int code) {
       return "it is damaged; load the logs into a new file";
     case SQLITE_FULL:
       return "free some space in its file system";
-    case SQLITE_CANTOPEN:
     case SQLITE_READONLY:
+      if (!writes) return "readers must be able to write in its folder too; or query a copy";
+      [[fallthrough]];
+    case SQLITE_CANTOPEN:
     case SQLITE_PERM:
     case SQLITE_AUTH:
       return "check owner and permissions of the file and its folder";
@@ -44,11 +46,13 @@ void Connection::Close::operator()(sqlite3* handle) const {
   sqlite3_close(handle);
 }
 
-Connection::Connection(const std::string& path, bool writes) : path_(path) {
+Connection::Connection(const std::string& path, bool writes) : path_(path), writes_(writes) {
+  // SQLite gives ":memory:" and "file:..." a meaning of their own.
+  const std::string plain = path.starts_with('/') ? path : "./" + path;
   sqlite3* handle = nullptr;
   const int flags = (writes ? SQLITE_OPEN_READWRITE | SQLITE_OPEN_CREATE : SQLITE_OPEN_READONLY) |
                     SQLITE_OPEN_NOMUTEX | SQLITE_OPEN_EXRESCODE;
-  const int code = sqlite3_open_v2(path.c_str(), &handle, flags, nullptr);
+  const int code = sqlite3_open_v2(plain.c_str(), &handle, flags, nullptr);
   handle_.reset(handle);
   if (code != SQLITE_OK) fail(code);
   sqlite3_busy_timeout(handle, kBusyMilliseconds);
@@ -59,7 +63,7 @@ void Connection::fail(int code) const {
   if (const int system = handle_ ? sqlite3_system_errno(handle()) : 0;
       system != 0 && ((code & 0xFF) == SQLITE_IOERR || (code & 0xFF) == SQLITE_CANTOPEN))
     text += std::string(" (") + std::strerror(system) + ")";
-  throw EngineError(text + ": " + adviceFor(code));
+  throw EngineError(text + ": " + adviceFor(code, writes_));
 }
 
 void Connection::execute(const char* sql) {

@@ -13,6 +13,7 @@ namespace tavrel::fleet {
 
 class Connection {
  public:
+  /// `path` names a file, whatever it begins with.
   Connection(const std::string& path, bool writes);
 
   void execute(const char* sql);
@@ -32,6 +33,7 @@ class Connection {
   };
 
   std::string path_;
+  bool writes_;
   std::unique_ptr<sqlite3, Close> handle_;
 };
 
