@@ -1,5 +1,10 @@
 #include "fleet/logs/log_metadata.h"
 
+#include <utility>
+
+#include "base/format.h"
+#include "base/utf8.h"
+#include "fleet/logs/limits.h"
 #include "platform/plist/coding.h"
 
 namespace tavrel::fleet {
@@ -46,6 +51,20 @@ std::string_view logNameOf(std::string_view fileName) {
 
 }  // namespace
 
+std::string faultOf(const LogMetadata& metadata) {
+  const std::pair<const char*, const std::string&> texts[] = {
+      {"the log type", metadata.logType},
+      {"the OS version", metadata.osVersion},
+      {"the previous OS version", metadata.previousOsVersion},
+      {"the configuration number", metadata.configNumber}};
+  for (const auto& [name, text] : texts) {
+    if (text.size() > limits::kTextBytes)
+      return format("%s has more than %zu bytes", name, limits::kTextBytes);
+    if (!isValidUtf8(text)) return format("%s is not UTF-8", name);
+  }
+  return "";
+}
+
 Expected<LogMetadata> readMetadataFile(ByteSpan document) {
   const auto value = plist::read(document);
   if (!value) return value.error();
@@ -56,6 +75,7 @@ Expected<LogMetadata> readMetadataFile(ByteSpan document) {
   const plist::Dictionary options = dictionary.dictionary("Options");
   for (const std::string_view key : {"previous_os_version", "ConfigNumber"})
     setOption(metadata, key, textOf(options, key));
+  if (std::string fault = faultOf(metadata); !fault.empty()) return Error{std::move(fault)};
   return metadata;
 }
 

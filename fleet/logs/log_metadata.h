@@ -16,7 +16,11 @@ struct LogMetadata {
   std::string configNumber;
 };
 
+/// Why a log with this metadata is refused: "the OS version is not UTF-8"; empty when it is not.
+std::string faultOf(const LogMetadata& metadata);
+
 /// Reads NAME.metadata.plist as a device writes it. Fields that are missing or mistyped stay empty.
+/// Metadata with a fault is an error.
 Expected<LogMetadata> readMetadataFile(ByteSpan document);
 
 /// Reads the value of the header `Tavrel-Options`, "KEY=VALUE&KEY=VALUE" with %XX, into the fields.

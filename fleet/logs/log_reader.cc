@@ -65,12 +65,8 @@ Expected<LogRecord> LogReader::read(ByteSpan bytes, const LogMetadata* metadata)
   record.distributions.reserve(distributions_);
   record.cells.reserve(cells_);
   if (metadata != nullptr) {
-    for (const std::string* const text :
-         {&metadata->osVersion, &metadata->previousOsVersion, &metadata->configNumber}) {
-      if (text->size() > limits::kTextBytes) {
-        return Error{format("its metadata has a text of more than %zu bytes", limits::kTextBytes)};
-      }
-    }
+    const std::string fault = faultOf(*metadata);
+    if (!fault.empty()) return Error{"its metadata: " + fault};
   }
   std::string fault = readDocument(bytes, record);
   if (!fault.empty()) return Error{std::move(fault)};

@@ -105,8 +105,17 @@ bool isFile(archive_entry* entry) {
 
 using Sidecars = std::unordered_map<std::string, Expected<LogMetadata>, KeyedHash>;
 
-Sidecars readSidecars(const std::string& path) {
+std::size_t bytesOf(const Sidecars::value_type& sidecar) {
+  const auto& [name, metadata] = sidecar;
+  const std::size_t bytes = sizeof sidecar + name.size();
+  return metadata ? bytes + metadata->logType.size() + metadata->osVersion.size() +
+                        metadata->previousOsVersion.size() + metadata->configNumber.size()
+                  : bytes + metadata.error().message.size();
+}
+
+Expected<Sidecars> readSidecars(const std::string& path) {
   Sidecars sidecars;
+  std::size_t kept = 0;
   Archive archive(path);
   std::string content;
   while (archive_entry* const entry = archive.next()) {
@@ -114,10 +123,15 @@ Sidecars readSidecars(const std::string& path) {
     if (!isFile(entry) || !isMetadataName(name)) continue;
     const bool isRead = archive.read(limits::kMetadataBytes, content);
     if (!isRead && !archive.failure().empty()) break;
-    sidecars.insert_or_assign(
+    const auto [sidecar, isNew] = sidecars.insert_or_assign(
         name, isRead ? readMetadataFile(asBytes(content))
                      : Expected<LogMetadata>(
                            Error{format("has more than %zu bytes", limits::kMetadataBytes)}));
+    kept += bytesOf(*sidecar);
+    if (kept > limits::kKeptMetadataBytes) {
+      return Error{format("its metadata takes more than %zu bytes: divide it into smaller archives",
+                          limits::kKeptMetadataBytes)};
+    }
   }
   return sidecars;
 }
@@ -136,7 +150,15 @@ Expected<std::optional<LogMetadata>> metadataOf(const std::string& name, const S
 }  // namespace
 
 void visitArchive(const std::string& path, const UploadLines& lines, const SourceSink& sink) {
-  const Sidecars sidecars = readSidecars(path);
+  const auto refuse = [&](const std::string& reason) {
+    SourceItem item;
+    item.kind = Kind::kRefused;
+    item.name = path;
+    item.reason = reason;
+    sink(std::move(item));
+  };
+  const Expected<Sidecars> sidecars = readSidecars(path);
+  if (!sidecars) return refuse(sidecars.error().message);
   Archive archive(path);
   while (archive_entry* const entry = archive.next()) {
     const std::string name(nameOf(entry));
@@ -149,7 +171,7 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
       sink(std::move(item));
       continue;
     }
-    const auto metadata = metadataOf(name, sidecars, lines);
+    const auto metadata = metadataOf(name, *sidecars, lines);
     if (metadata) item.metadata = *metadata;
     if (isOtherLog(withoutGzip(fileNameOf(name)), item.metadata ? &*item.metadata : nullptr)) {
       item.kind = Kind::kOther;
@@ -165,13 +187,7 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
     }
     sink(std::move(item));
   }
-  if (!archive.failure().empty()) {
-    SourceItem item;
-    item.kind = Kind::kRefused;
-    item.name = path;
-    item.reason = archive.failure();
-    sink(std::move(item));
-  }
+  if (!archive.failure().empty()) refuse(archive.failure());
 }
 
 }  // namespace tavrel::fleet

@@ -187,6 +187,17 @@ TEST_F(LoadTest, TakesArchives) {
   ASSERT_EQ(std::system(bomb.c_str()), 0);
   EXPECT_EQ(run({at("bomb.tar")}).error,
             "tavrel-fleet: refused: bomb.tar: expands to more than 1000 times its size\n");
+  const std::string sidecars = format(
+      "cd %s && python3 -c 'import tarfile\n"
+      "with tarfile.open(\"many.tgz\", \"w:gz\", compresslevel=1, format=tarfile.GNU_FORMAT) as "
+      "tar:\n"
+      " for i in range(260): tar.addfile(tarfile.TarInfo(\"x\" * 2**19 + "
+      "f\"{i}.metadata.plist\"))'",
+      at(""));
+  ASSERT_EQ(std::system(sidecars.c_str()), 0);
+  EXPECT_EQ(run({at("many.tgz")}).error,
+            "tavrel-fleet: refused: many.tgz: its metadata takes more than 134217728 bytes: divide "
+            "it into smaller archives\n");
 }
 
 TEST_F(LoadTest, SetsAsideWhatItRefuses) {

@@ -95,7 +95,15 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
   EXPECT_EQ(reader.read(asBytes(kSampleLog), nullptr)->digest, *digest);
   metadata.configNumber.assign(4097, '7');
   EXPECT_EQ(reader.read(asBytes(kSampleLog), &metadata).error().message,
-            "its metadata has a text of more than 4096 bytes");
+            "its metadata: the configuration number has more than 4096 bytes");
+  metadata.osVersion = "\xFF";
+  EXPECT_EQ(reader.read(asBytes(kSampleLog), &metadata).error().message,
+            "its metadata: the OS version is not UTF-8");
+  EXPECT_EQ(readMetadataFile(asBytes("<plist><dict><key>LogType</key><string>" +
+                                     std::string(4097, '7') + "</string></dict></plist>"))
+                .error()
+                .message,
+            "the log type has more than 4096 bytes");
 }
 
 TEST(LogReaderTest, TellsLogsApartByAllThatTheySay) {
