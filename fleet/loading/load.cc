@@ -99,7 +99,7 @@ Expected<LoadCounts> load(Engine& engine, const LoadRequest& request,
   ReadingThreads reading(
       [&](const SourceSink& sink) {
         for (const std::string& path : request.paths)
-          visitSources(path, lines, sink);
+          visitSources(path, lines, sink, request.setAside);
       },
       permitted, readers());
   while (auto item = reading.next()) {

@@ -17,7 +17,7 @@ struct LoadRequest {
   std::vector<std::string> paths;
   std::vector<std::string> uploadLines;  // files with the metadata that an upload server noted
   std::vector<std::string> whitelists;   // when there are none, all keys are permitted
-  std::optional<std::string> setAside;   // the folder for copies of refused logs
+  std::optional<std::string> setAside;   // folder for copies of refused logs; not read
 };
 
 struct LoadCounts {

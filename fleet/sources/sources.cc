@@ -71,7 +71,8 @@ struct Entry {
 
 class Visit {
  public:
-  Visit(const UploadLines& lines, const SourceSink& sink) : lines_(lines), sink_(sink) {}
+  Visit(const UploadLines& lines, const SourceSink& sink, const std::optional<std::string>& leftOut)
+      : lines_(lines), sink_(sink), leftOut_(leftOut) {}
 
   void folder(const std::string& path, Descriptor opened, std::size_t depth) {
     struct Close {
@@ -130,19 +131,28 @@ class Visit {
     Descriptor opened(
         openat(parent, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     if (!opened) return give(sink_, Kind::kRefused, path, cannot("opened"));
-    folder(path, std::move(opened), depth + 1);
+    if (!isLeftOut(opened)) folder(path, std::move(opened), depth + 1);
+  }
+
+  bool isLeftOut(const Descriptor& opened) const {
+    struct stat found {};
+    struct stat leftOut {};
+    return leftOut_ && stat(leftOut_->c_str(), &leftOut) == 0 && fstat(opened.get(), &found) == 0 &&
+           found.st_dev == leftOut.st_dev && found.st_ino == leftOut.st_ino;
   }
 
   const UploadLines& lines_;
   const SourceSink& sink_;
+  const std::optional<std::string>& leftOut_;
 };
 
 }  // namespace
 
-void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink) {
+void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink,
+                  const std::optional<std::string>& leftOut) {
   struct stat status {};
   if (stat(path.c_str(), &status) != 0) return give(sink, Kind::kRefused, path, cannot("found"));
-  Visit visit(lines, sink);
+  Visit visit(lines, sink, leftOut);
   if (S_ISDIR(status.st_mode)) {
     Descriptor opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (!opened) return give(sink, Kind::kRefused, path, cannot("opened"));

@@ -208,8 +208,9 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
   std::filesystem::create_symlink("good.log", at("in/link.log"));
   std::filesystem::create_directory_symlink(at("in"), at("in/sub/loop"));
   ASSERT_EQ(mkfifo(at("in/pipe.log").c_str(), 0600), 0);
+  std::filesystem::create_directory(at("in/z"));
   for (int time = 0; time < 2; ++time) {
-    const Outcome outcome = run({at("in"), at("none.log"), "--set-aside", at("aside/deep")});
+    const Outcome outcome = run({at("in"), at("none.log"), "--set-aside", at("in/z/aside")});
     EXPECT_EQ(outcome.error,
               "tavrel-fleet: refused: in/b\\x1b\\n.log: is not a property list\n"
               "tavrel-fleet: refused: in/bad.log: is not a property list\n"
@@ -220,7 +221,7 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
     EXPECT_EQ(outcome.status, 1);
   }
   std::map<std::string, std::string> kept;
-  for (const auto& file : std::filesystem::directory_iterator(at("aside/deep")))
+  for (const auto& file : std::filesystem::directory_iterator(at("in/z/aside")))
     kept[file.path().filename().string().substr(17)] = withoutFolder(contentOf(file.path()));
   EXPECT_EQ(kept,
             (std::map<std::string, std::string>{
