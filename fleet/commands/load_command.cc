@@ -19,6 +19,9 @@ struct LoadOptions {
 class Progress {
  public:
   explicit Progress(FleetContext& context) : context_(context) {}
+  ~Progress() { clear(); }
+  Progress(const Progress&) = delete;
+  Progress& operator=(const Progress&) = delete;
   void show(const LoadCounts& counts) {
     if (!context_.showsProgress()) return;
     context_.error() << format("\r%zu loaded, %zu known, %zu refused", counts.loaded, counts.known,
