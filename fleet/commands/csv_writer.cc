@@ -5,7 +5,17 @@
 #include <cmath>
 #include <ostream>
 
+#include "base/utf8.h"
+
 namespace tavrel::fleet {
+namespace {
+
+bool isControl(char32_t codePoint) {
+  return (codePoint < 0x20 && codePoint != '\t' && codePoint != '\r' && codePoint != '\n') ||
+         (codePoint >= 0x7F && codePoint < 0xA0);
+}
+
+}  // namespace
 
 void CsvWriter::separate() {
   if (!isFirst_) out_ << ',';
@@ -29,8 +39,13 @@ CsvWriter& CsvWriter::title(std::string_view value) {
 
 CsvWriter& CsvWriter::text(std::string_view value) {
   constexpr std::string_view kFormulas = "=+-@\t\r";
-  if (value.empty() || kFormulas.find(value.front()) == std::string_view::npos) return title(value);
-  return title("'" + std::string(value));
+  std::string safe;
+  if (!value.empty() && kFormulas.find(value.front()) != std::string_view::npos) safe = "'";
+  while (!value.empty()) {
+    const char32_t codePoint = takeCodePoint(value);
+    appendCodePoint(safe, isControl(codePoint) ? kReplacementCharacter : codePoint);
+  }
+  return title(safe);
 }
 
 CsvWriter& CsvWriter::real(double value) {

@@ -12,7 +12,8 @@ class CsvWriter {
  public:
   explicit CsvWriter(std::ostream& out) : out_(out) {}
 
-  /// Prefixes an apostrophe to outside text that a spreadsheet would run as a formula.
+  /// Prefixes an apostrophe to outside text that a spreadsheet would run as a formula. Malformed
+  /// bytes, and control characters other than tab and line ends, become replacement characters.
   CsvWriter& text(std::string_view value);
   /// A title, or text of our own.
   CsvWriter& title(std::string_view value);

@@ -7,6 +7,7 @@
 #include <regex>
 #include <sstream>
 
+#include "fleet/commands/csv_writer.h"
 #include "fleet/fleet_tool.h"
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
@@ -260,6 +261,12 @@ TEST_F(QuestionCommands, AreOnTheManualPage) {
       "\\fB\\-\\-days\\fR \\fIDAYS\\fR\nFIRST..LAST, one day, or a number of days up to "
       "the newest (default: all).\n.TP\n\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR\nShow no "
       "group of fewer devices (default 10, at least 3).\n.RE\n");
+}
+
+TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
+  std::ostringstream out;
+  CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F");
+  EXPECT_EQ(out.str(), "\uFFFD\uFFFD[m\uFFFD\tü,'=\uFFFD");
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
