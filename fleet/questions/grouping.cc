@@ -78,7 +78,9 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
   }
   if (order.size() > kMostGroups) {
     std::nth_element(order.begin(), order.begin() + kMostGroups, order.end(), [&](auto a, auto b) {
-      return counts[a] != counts[b] ? counts[a] > counts[b] : a < b;
+      if (counts[a] != counts[b]) return counts[a] > counts[b];
+      // Texts are numbered in the order of loading.
+      return byDay ? a < b : texts[a] < texts[b];
     });
     smallValues += order.size() - kMostGroups;
     order.resize(kMostGroups);

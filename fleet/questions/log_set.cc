@@ -83,6 +83,14 @@ std::size_t LogSet::hash() const {
   return static_cast<std::size_t>(result);
 }
 
+LogSet logsOn(const LogTable& table, const DayRange& days) {
+  LogSet logs(table);
+  for (LogIndex log = 0; log < table.size(); ++log) {
+    if (days.contains(table.day(log))) logs.insert(log);
+  }
+  return logs;
+}
+
 void DeviceCounter::insert(LogIndex log) {
   if (seen_[log]) return;
   seen_[log] = true;

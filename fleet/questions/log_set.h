@@ -49,6 +49,9 @@ class LogSet {
   std::vector<std::uint64_t> words_;
 };
 
+/// The logs of these days.
+LogSet logsOn(const LogTable& table, const DayRange& days);
+
 /// Counts the devices of a set that grows log by log.
 class DeviceCounter {
  public:

@@ -6,6 +6,7 @@
 
 #include "fleet/pages/fleet_page.h"
 #include "fleet/questions/compare.h"
+#include "fleet/questions/grouping.h"
 #include "fleet/questions/show.h"
 #include "fleet/questions/summary.h"
 #include "tests/fleet/questions_fleet.h"
@@ -60,6 +61,14 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
       show(fleet.engine(), again, {.key = "s", .days = {1, 1}, .againstDays = DayRange{2, 3}});
   EXPECT_EQ(beside.sides[1].whole.logs, 40u);
   EXPECT_EQ(summarise(fleet.engine(), again, {}).parts[0].groups.size(), 0u);  // 4.9 has one device
+}
+
+TEST(ShowTest, JoinsTheSameValuesInWhateverOrderTheyWereLoaded) {
+  TestFleet fleet;
+  for (int region = 2000; region >= 1000; --region)
+    fleet.add(1, "OS", std::to_string(region));
+  const LogTable table(fleet.engine());
+  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::kRegion, 1).at(999).name.value, "1999");
 }
 
 TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
