@@ -160,12 +160,13 @@ void addSummaryCommand(Command top, FleetContext& context) {
   auto options = std::make_shared<SummaryOptions>();
   addQuestionOptions(summary, *options);
   addFormOptions(summary, context, *options);
-  summary.addFlag("--keys", options->keys, "List all statistics instead");
+  summary.addFlag("--keys", options->keys, "List the statistics instead");
   summary.onRun([&context, options] {
     ask(context, *options, [&](Question& question) {
       if (options->keys) {
         return printKeys(context, *options,
-                         shownKeys(question.engine(), question.ledger(), question.days()));
+                         shownKeys(question.engine(), question.ledger(),
+                                   logsOn(question.table(), question.days())));
       }
       const SummaryAnswer answer = summarise(question.engine(), question.ledger(), question.days());
       if (context.json()) return context.printJson(summaryJson(answer));

@@ -131,14 +131,15 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
     html.element("li", "and " + countText(changes - kMostSentences) + " more, listed below.");
   }
   if (changes != 0) html.end();
-  if (!page.wear.empty() && page.wear.front().sides.front().isShown) {
-    const ShowAnswer& wear = page.wear.front();
-    const ShownSet& all = wear.sides.front().whole;
-    const std::string_view unit = unitOf(wear.request.key);
+  const auto wear = std::ranges::find_if(
+      page.wear, [](const ShowAnswer& answer) { return answer.sides.front().isShown; });
+  if (wear != page.wear.end()) {
+    const ShownSet& all = wear->sides.front().whole;
+    const std::string_view unit = unitOf(wear->request.key);
     if (all.scalar) {
       html.begin("p");
       html.text("Flash: ");
-      html.name(nameOf(wear.request.key));
+      html.name(nameOf(wear->request.key));
       html.text(" is at most " +
                 page::figureText(static_cast<double>(all.scalar->percentiles[2]), unit) +
                 " in half of the daily logs, and above " +

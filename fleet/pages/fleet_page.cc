@@ -39,7 +39,8 @@ ShowAnswer askAbout(Engine& engine, Ledger& ledger, const Key& key, const DayRan
 
 FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
   FleetPage page;
-  page.summary = summarise(engine, ledger, days);
+  // The same logs as in the statistics: otherwise subtracting these would reveal small versions.
+  page.summary = summarise(engine, ledger, days, SmallVersions::kLeftOut);
   if (!page.summary.isShown) return page;
   if (const auto versions = newestVersions(ledger, days)) {
     page.comparison = compare(engine, ledger, {versions->first, versions->second, days});
@@ -62,18 +63,20 @@ FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
       add(one.key);
     }
   }
-  const std::vector<Key> keys = engine.keys();
   for (const KeyKind kind : {KeyKind::kDistribution, KeyKind::kScalar}) {
-    for (const Key& key : keys) {
+    for (const Key& key : page.summary.keys) {
       if (key.kind == kind && !known.contains({key.kind, key.name})) add(key);
     }
   }
-  if (others.size() > kMostStatistics) {
-    page.furtherStatistics = others.size() - kMostStatistics;
-    others.resize(kMostStatistics);
-  }
-  for (const Key& key : others)
+  std::size_t shown = 0;
+  for (const Key& key : others) {
+    if (shown == kMostStatistics) {
+      ++page.furtherStatistics;
+      continue;
+    }
     page.statistics.push_back(askAbout(engine, ledger, key, days));
+    if (page.statistics.back().sides.front().isShown) ++shown;
+  }
   return page;
 }
 
@@ -81,7 +84,7 @@ std::string textOf(const FleetPage& page) {
   const SummaryAnswer& summary = page.summary;
   page::Document document("Fleet");
   if (!summary.isShown) {
-    document.head().element("p", "There are fewer than " + countText(summary.devicesAtLeast) +
+    document.head().element("p", "No OS version has at least " + countText(summary.devicesAtLeast) +
                                      " devices on these days: nothing is shown.");
     return document.text();
   }
@@ -113,8 +116,8 @@ std::string textOf(const FleetPage& page) {
                "A percentage over a column of figures is the share of logs, or of values, that are "
                "not above the figure. Of series only the range in which it lies is known.");
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
-                        " devices are not shown by themselves. Statistics leave such versions out; "
-                        "in \"The fleet\" they are joined as \"" +
+                        " devices are not shown by themselves. The page leaves out all logs of "
+                        "such versions; other groups are joined as \"" +
                         PartName{PartKind::kOther}.text() +
                         "\", and where a subtraction could reveal them, so is the next larger "
                         "group. Buckets of histograms are joined in the same way.");

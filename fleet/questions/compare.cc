@@ -286,16 +286,7 @@ CompareAnswer compare(Engine& engine, Ledger& ledger, const CompareRequest& requ
 
 std::optional<std::pair<std::string, std::string>> newestVersions(const Ledger& ledger,
                                                                   const DayRange& days) {
-  const LogTable& table = ledger.table();
-  LogSet all(table);
-  for (LogIndex log = 0; log < table.size(); ++log) {
-    if (days.contains(table.day(log))) all.insert(log);
-  }
-  std::vector<std::string> versions;
-  for (const Group& group : groupsOf(table, all, GroupBy::kOs, ledger.devicesAtLeast())) {
-    if (!group.name.isValue() || !ledger.hasEnough(group.logs)) continue;
-    versions.push_back(group.name.value);
-  }
+  const std::vector<std::string> versions = shownVersions(ledger, days);
   if (versions.size() < 2) return std::nullopt;
   return std::pair(versions[versions.size() - 2], versions.back());
 }

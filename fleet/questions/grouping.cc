@@ -104,4 +104,33 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
   return groups;
 }
 
+void leaveSmallOut(std::vector<Group>& groups, const Ledger& ledger) {
+  std::erase_if(groups, [&](const Group& group) {
+    return group.name.kind == PartKind::kOther || !ledger.hasEnough(group.logs);
+  });
+}
+
+std::vector<std::string> shownVersions(const Ledger& ledger, const DayRange& days) {
+  const LogTable& table = ledger.table();
+  const auto texts = table.texts(Attribute::kOs);
+  std::vector<std::size_t> devices(texts.size());
+  std::vector<std::size_t> ofDay(texts.size());
+  for (const LogTable::Day& day : table.days()) {
+    if (!days.contains(day.day)) continue;
+    for (LogIndex log = day.begin; log < day.end; ++log) {
+      const std::uint32_t version = table.attribute(Attribute::kOs, log);
+      devices[version] = std::max(devices[version], ++ofDay[version]);
+    }
+    for (LogIndex log = day.begin; log < day.end; ++log)
+      ofDay[table.attribute(Attribute::kOs, log)] = 0;
+  }
+  std::vector<std::string> versions;
+  for (std::size_t version = 0; version < texts.size(); ++version) {
+    if (!texts[version].empty() && devices[version] >= ledger.devicesAtLeast())
+      versions.push_back(texts[version]);
+  }
+  std::sort(versions.begin(), versions.end(), versionLess);
+  return versions;
+}
+
 }  // namespace tavrel::fleet

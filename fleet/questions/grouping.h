@@ -21,4 +21,10 @@ bool versionLess(std::string_view a, std::string_view b);
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast);
 
+/// Removes the groups of too few devices, and the one of the kind kOther.
+void leaveSmallOut(std::vector<Group>& groups, const Ledger& ledger);
+
+/// The versions that have enough devices on these days, by number.
+std::vector<std::string> shownVersions(const Ledger& ledger, const DayRange& days);
+
 }  // namespace tavrel::fleet

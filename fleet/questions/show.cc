@@ -230,11 +230,7 @@ ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
   const auto addSide = [&](std::string title, const auto& isOnSide) {
     const LogSet logs = logsOf(table, rows, isOnSide);
     std::vector<Group> groups = groupsOf(table, logs, request.by, ledger.devicesAtLeast());
-    if (request.leavesSmallOut) {
-      std::erase_if(groups, [&](const Group& group) {
-        return group.name.kind == PartKind::kOther || !ledger.hasEnough(group.logs);
-      });
-    }
+    if (request.leavesSmallOut) leaveSmallOut(groups, ledger);
     Division division = divide(ledger, subject, std::move(groups));
     if (request.by == GroupBy::kNone) division.groups.clear();
     answer.sides.push_back(answers.answer(std::move(title), division));

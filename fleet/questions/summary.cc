@@ -23,13 +23,15 @@ CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogS
   return result;
 }
 
-bool hasEnough(Engine& engine, const Ledger& ledger, const DayRange& days, const Key& key) {
+}  // namespace
+
+bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key) {
   const LogTable& table = ledger.table();
   LogSet logs(table);
   const auto take = [&](const auto& rows) {
     for (const auto& row : rows) {
       const LogIndex log = table.find(row.log);
-      if (log != kNoLog && days.contains(table.day(log))) logs.insert(log);
+      if (log != kNoLog && among.contains(log)) logs.insert(log);
     }
   };
   switch (key.kind) {
@@ -46,22 +48,24 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const DayRange& days, const
   return ledger.hasEnough(logs);
 }
 
-}  // namespace
-
-std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const DayRange& days) {
+std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among) {
   std::vector<Key> keys = engine.keys();
-  std::erase_if(keys, [&](const Key& key) { return !hasEnough(engine, ledger, days, key); });
+  std::erase_if(keys, [&](const Key& key) { return !hasEnough(engine, ledger, among, key); });
   return keys;
 }
 
-SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days) {
+SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days, SmallVersions small) {
   const LogTable& table = ledger.table();
   SummaryAnswer answer;
   answer.devicesAtLeast = ledger.devicesAtLeast();
   answer.days = days;
-  LogSet logs(table);
-  for (LogIndex log = 0; log < table.size(); ++log) {
-    if (days.contains(table.day(log))) logs.insert(log);
+  LogSet logs = logsOn(table, days);
+  if (small == SmallVersions::kLeftOut) {
+    std::vector<Group> versions = groupsOf(table, logs, GroupBy::kOs, ledger.devicesAtLeast());
+    leaveSmallOut(versions, ledger);
+    logs = LogSet(table);
+    for (const Group& version : versions)
+      logs.add(version.logs);
   }
   for (const GroupBy by : {GroupBy::kOs, GroupBy::kRegion, GroupBy::kDigest, GroupBy::kDay}) {
     const Division division =
@@ -75,7 +79,8 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days) {
   }
   answer.isShown = true;
   answer.whole = countedGroup(ledger, {PartKind::kWhole}, logs);
-  for (const Key& key : shownKeys(engine, ledger, days)) {
+  answer.keys = shownKeys(engine, ledger, logs);
+  for (const Key& key : answer.keys) {
     std::size_t& count = key.kind == KeyKind::kScalar         ? answer.scalarKeys
                          : key.kind == KeyKind::kDistribution ? answer.distributionKeys
                                                               : answer.histogramKeys;

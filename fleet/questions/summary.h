@@ -32,15 +32,23 @@ struct SummaryAnswer {
   bool isShown = false;  ///< when false, there are too few devices, and the rest is empty
   CountedGroup whole;
   std::vector<SummaryPart> parts;  ///< by version, region, whitelist and day
+  std::vector<Key> keys;           ///< the statistics that have enough devices
   std::size_t scalarKeys = 0;
   std::size_t distributionKeys = 0;
   std::size_t histogramKeys = 0;
 };
 
-/// The statistics that have enough devices on these days. Reads all rows. Throws EngineError.
-std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const DayRange& days);
+/// Whether enough devices have the statistic in these logs. Throws EngineError.
+bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key);
+
+/// The statistics that enough devices have in these logs. Reads all rows. Throws EngineError.
+std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among);
+
+/// What happens to logs of versions that have too few devices.
+enum class SmallVersions : std::uint8_t { kJoined, kLeftOut };
 
 /// Throws EngineError.
-SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days);
+SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days,
+                        SmallVersions small = SmallVersions::kJoined);
 
 }  // namespace tavrel::fleet

@@ -170,10 +170,17 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
   TestFleet fleet;
   for (int device = 0; device < 43; ++device)
     fleet.add(1, device < 3 ? "4.0" : device < 28 ? "4.1" : "4.2").scalars = {{"s", device}};
+  LogRecord& talkative = fleet.add(1, "4.2");
+  for (int key = 0; key < 45; ++key)
+    talkative.scalars.push_back({talkative.texts.keep("a" + std::to_string(key)), 1});
   const LogTable table(fleet.engine());
   Ledger ledger(table, 10);
   const FleetPage page = askForPage(fleet.engine(), ledger, {});
   expectNothingSmallFollows(ledger);
+  EXPECT_THAT(titles(page.summary.parts[0].groups), ElementsAre("4.1 25/25", "4.2 16/16"));
+  EXPECT_EQ(page.summary.whole.logs, 41u);
+  EXPECT_EQ(page.statistics.size(), 1u);
+  EXPECT_EQ(page.furtherStatistics, 0u);
   EXPECT_EQ(page.comparison->comparisons.size(), 1u);
   EXPECT_THAT(titles(page.statistics.at(0).sides.at(0).groups),
               ElementsAre("4.1 25/25", "4.2 15/15"));
