@@ -7,7 +7,6 @@
 #include <string>
 
 #include "fleet/commands/question.h"
-#include "fleet/questions/grouping.h"
 #include "tools/completion/scripts/completion_script.h"
 #include "tools/completion/scripts/man_page.h"
 
@@ -40,14 +39,8 @@ std::optional<std::string> wordFor(const Question& question, const std::string& 
 
 void listVersions(FleetContext& context) {
   Question question(context, {});
-  const LogTable& table = question.table();
-  LogSet all(table);
-  for (LogIndex log = 0; log < table.size(); ++log)
-    all.insert(log);
-  const std::size_t least = question.ledger().devicesAtLeast();
-  for (const Group& group : groupsOf(table, all, GroupBy::kOs, least)) {
-    if (!group.name.isValue() || !question.ledger().hasEnough(group.logs)) continue;
-    if (const auto word = wordFor(question, group.name.value)) context.out() << *word << '\n';
+  for (const std::string& version : question.versions()) {
+    if (const auto word = wordFor(question, version)) context.out() << *word << '\n';
   }
 }
 

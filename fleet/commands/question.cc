@@ -6,6 +6,7 @@
 
 #include "base/civil_time.h"
 #include "fleet/questions/day_range.h"
+#include "fleet/questions/grouping.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
@@ -46,7 +47,8 @@ Option addFormOptions(Command command, FleetContext& context, QuestionOptions& o
 Question::Question(FleetContext& context, const QuestionOptions& options)
     : engine_(context.openDatabase(OpenMode::kRead)),
       table_(*engine_),
-      ledger_(table_, devicesAtLeastOf(options)) {
+      ledger_(table_, devicesAtLeastOf(options)),
+      versions_(shownVersions(ledger_, {})) {
   if (table_.size() == 0) {
     throw EngineError(context.database() + ": holds no logs: load some with tavrel-fleet load");
   }
@@ -60,7 +62,12 @@ Question::Question(FleetContext& context, const QuestionOptions& options)
 }
 
 DayRange Question::readDays(std::string_view text) const {
-  const auto days = parseDayRange(text, table_.days().back().day);
+  // One device with a wrong clock must not decide which days are the newest.
+  std::int32_t newest = table_.days().back().day;
+  for (const LogTable::Day& day : table_.days()) {
+    if (day.end - day.begin >= ledger_.devicesAtLeast()) newest = day.day;
+  }
+  const auto days = parseDayRange(text, newest);
   if (!days) throw UsageError(days.error().message);
   return *days;
 }
@@ -86,9 +93,11 @@ bool hasPart(std::string_view version, std::string_view part) {
 }  // namespace
 
 std::string Question::readVersion(std::string_view text) const {
-  if (table_.number(Attribute::kOs, text)) return std::string(text);
   const std::string* found = nullptr;
-  for (const std::string& version : table_.texts(Attribute::kOs)) {
+  for (const std::string& version : versions_) {
+    if (version == text) return version;
+  }
+  for (const std::string& version : versions_) {
     if (!hasPart(version, text)) continue;
     if (found != nullptr) {
       throw std::runtime_error("version \"" + printable(text) +
@@ -101,8 +110,9 @@ std::string Question::readVersion(std::string_view text) const {
         "no log says its OS version: load the logs with their metadata, see docs/fleet-loading.md");
   }
   if (found == nullptr) {
-    throw std::runtime_error("version \"" + printable(text) +
-                             "\" is in no log: tavrel-fleet summary lists the versions");
+    throw std::runtime_error("version \"" + printable(text) + "\" " +
+                             inFewLogsText(ledger_.devicesAtLeast()) +
+                             ": tavrel-fleet summary lists the versions");
   }
   return *found;
 }
@@ -115,6 +125,10 @@ void ask(FleetContext& context, const QuestionOptions& options,
   } catch (const UsageError& error) {
     context.failUsage(error.what());
   }
+}
+
+std::string inFewLogsText(std::size_t devicesAtLeast) {
+  return "is in no log, or in logs of fewer than " + std::to_string(devicesAtLeast) + " devices";
 }
 
 std::string tooFewText(std::size_t devicesAtLeast) {

@@ -8,6 +8,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "fleet/commands/fleet_context.h"
 #include "fleet/questions/ledger.h"
@@ -43,8 +44,11 @@ class Question {
   Ledger& ledger() { return ledger_; }
   const DayRange& days() const { return days_; }
 
+  /// A number of days ends with the newest day that has enough devices.
   DayRange readDays(std::string_view text) const;
-  /// The version that the text names, either in full or by a part that no other version contains.
+  /// Those of enough devices, by number.
+  const std::vector<std::string>& versions() const { return versions_; }
+  /// The one of these that the text names, either in full or by a part that no other one contains.
   /// Throws std::runtime_error with a readable line.
   std::string readVersion(std::string_view text) const;
 
@@ -52,6 +56,7 @@ class Question {
   std::unique_ptr<Engine> engine_;
   LogTable table_;
   Ledger ledger_;
+  const std::vector<std::string> versions_;
   DayRange days_;
 };
 
@@ -59,6 +64,8 @@ class Question {
 void ask(FleetContext& context, const QuestionOptions& options,
          const std::function<void(Question& question)>& run);
 
+/// "is in no log, or in logs of fewer than 10 devices": a message that hides which.
+std::string inFewLogsText(std::size_t devicesAtLeast);
 /// "fewer than 10 devices: nothing is shown".
 std::string tooFewText(std::size_t devicesAtLeast);
 /// A sentence about groups that are shown as one; empty when there are none.

@@ -1,9 +1,11 @@
 #include "fleet/commands/show_command.h"
 
+#include <algorithm>
 #include <nlohmann/json.hpp>
 
 #include "fleet/commands/question.h"
 #include "fleet/commands/show_output.h"
+#include "fleet/questions/summary.h"
 #include "tools/shared/table.h"
 
 namespace tavrel::fleet {
@@ -26,7 +28,7 @@ GroupBy groupBy(const std::string& name) {
 
 /// Tries a whole version first, then a range of days, then a part of a version.
 void readAgainst(const Question& question, const std::string& text, ShowRequest& request) {
-  if (!question.table().number(Attribute::kOs, text)) {
+  if (std::ranges::find(question.versions(), text) == question.versions().end()) {
     try {
       request.againstDays = question.readDays(text);
     } catch (const UsageError&) {
@@ -36,8 +38,10 @@ void readAgainst(const Question& question, const std::string& text, ShowRequest&
   if (!request.againstDays) {
     request.againstVersion = question.readVersion(text);
   } else if (request.againstDays->overlaps(request.days)) {
+    const bool isNumber = text.find_first_not_of("0123456789") == std::string::npos;
     throw UsageError("--against: " + textOf(*request.againstDays) + " and " + textOf(request.days) +
-                     " overlap: choose separate days with --days");
+                     " overlap: choose separate days with --days" +
+                     (isNumber ? "; for a version, write more of its name" : ""));
   }
 }
 
@@ -51,11 +55,17 @@ std::vector<ShowAnswer> answers(Question& question, const ShowOptions& options) 
   for (const Key& key : question.engine().keys()) {
     if (key.name != options.key || key.kind == KeyKind::kHistogram) continue;
     request.kind = key.kind;
-    result.push_back(show(question.engine(), question.ledger(), request));
+    ShowAnswer answer = show(question.engine(), question.ledger(), request);
+    // Not even whether a few devices have the statistic.
+    if (std::ranges::any_of(answer.sides, &ShowSide::isShown) ||
+        hasEnough(question.engine(), question.ledger(), logsOn(question.table(), {}), key)) {
+      result.push_back(std::move(answer));
+    }
   }
   if (result.empty()) {
-    throw std::runtime_error("statistic \"" + printable(options.key) +
-                             "\" is in no log: tavrel-fleet summary --keys lists all");
+    throw std::runtime_error("statistic \"" + printable(options.key) + "\" " +
+                             inFewLogsText(question.ledger().devicesAtLeast()) +
+                             ": tavrel-fleet summary --keys lists the statistics");
   }
   return result;
 }

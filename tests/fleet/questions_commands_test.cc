@@ -271,31 +271,47 @@ TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
   load(file, 1);
+  LogRecord rare = makeRecord(1000, 47480);  // of one device, whose clock is wrong
+  rare.osVersion = "OS 9";
+  rare.scalars = {{"rare", 1}};
+  openEngine(file, OpenMode::kWrite)->append({&rare, 1});
   const struct {
     std::vector<std::string> arguments;
     int status;
     const char* message;
-  } cases[] = {{{"show", "x\x1b"},
-                1,
-                "statistic \"x\\x1b\" is in no log: tavrel-fleet summary --keys lists all"},
-               {{"show", "=sum", "--against", "1"},
-                2,
-                "--against: 2026-11-24 and all days overlap: choose separate days with --days"},
-               {{"show", "=sum", "--against", "5.0"},
-                1,
-                "version \"5.0\" is in no log: tavrel-fleet summary lists the versions"},
-               {{"compare", "OS", "4.10"},
-                1,
-                "version \"OS\" is part of several versions: write one of them in full"},
-               {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
-               {{"summary", "--days", "0"},
-                2,
-                "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
-                "or a number of days"},
-               {{"summary", "--devices-at-least", "2"},
-                2,
-                "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
-                "can work out the figures of another"}};
+  } cases[] = {
+      {{"show", "x\x1b"},
+       1,
+       "statistic \"x\\x1b\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
+       "summary --keys lists the statistics"},
+      {{"show", "rare", "--days", "1"},
+       1,
+       "statistic \"rare\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
+       "summary --keys lists the statistics"},
+      {{"show", "=sum", "--against", "1"},
+       2,
+       "--against: 2026-11-24 and all days overlap: choose separate days with --days; for a "
+       "version, write more of its name"},
+      {{"show", "=sum", "--against", "5.0"},
+       1,
+       "version \"5.0\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
+       "summary lists the versions"},
+      {{"compare", "OS 9", "4.10"},
+       1,
+       "version \"OS 9\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
+       "summary lists the versions"},
+      {{"compare", "OS", "4.10"},
+       1,
+       "version \"OS\" is part of several versions: write one of them in full"},
+      {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
+      {{"summary", "--days", "0"},
+       2,
+       "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
+       "or a number of days"},
+      {{"summary", "--devices-at-least", "2"},
+       2,
+       "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
+       "can work out the figures of another"}};
   for (const auto& [arguments, status, message] : cases) {
     const Output output = run(file, arguments);
     EXPECT_EQ(output.error, "tavrel-fleet: " + std::string(message) + "\n");
