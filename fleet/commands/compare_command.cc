@@ -21,20 +21,25 @@ struct CompareOptions : QuestionOptions {
   bool all = false;
 };
 
-std::string percentOf(std::optional<double> share) {
-  if (!share || !std::isfinite(*share)) return "";
-  return (*share > 0 ? "+" : "") + shortNumber(std::round(*share * 1000) / 10) + " %";
-}
-
 std::string signedText(double value) {
   return (value > 0 ? "+" : "") + shortNumber(value);
+}
+
+/// Never -0.
+double rounded(double value, double digits) {
+  return std::round(value * digits) / digits + 0.0;
+}
+
+std::string percentOf(std::optional<double> share) {
+  if (!share || !std::isfinite(*share)) return "";
+  return signedText(rounded(*share, 1000) * 100) + " %";
 }
 
 /// Probabilities are rounded to two digits.
 std::string pValueText(double value) {
   if (value < 1e-300) return "0";
   const double digits = std::pow(10, 1 - std::floor(std::log10(value)));
-  return shortNumber(std::round(value * digits) / digits);
+  return shortNumber(rounded(value, digits));
 }
 
 const char* kindName(const Comparison& one) {
@@ -91,7 +96,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
          percentOf(one.relative),
          signedText(one.difference - one.margin) + " to " + signedText(one.difference + one.margin),
          unitOf(one.key.name),
-         one.effect ? signedText(std::round(*one.effect * 100) / 100) : "constant",
+         one.effect ? signedText(rounded(*one.effect, 100)) : "constant",
          pValueText(one.adjustedPValue),
          withoutMean(one) == 0 ? "" : std::to_string(withoutMean(one))});
   }

@@ -139,8 +139,8 @@ std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAt
   if (joined == 0) return "";
   const std::string why = "groups of fewer than " + std::to_string(devicesAtLeast) + " devices";
   if (!hasGroups) return "Not divided: the parts would reveal " + why + ".";
-  return PartName{PartKind::kOther}.text() + " joins " + std::to_string(joined) +
-         " groups, so that nothing reveals " + why + ".";
+  return PartName{PartKind::kOther}.text() + " joins " + counted(joined, "group") +
+         ", so that nothing reveals " + why + ".";
 }
 
 std::string noMeanText() {

@@ -14,8 +14,9 @@ namespace {
 
 constexpr std::size_t kMostSentences = 8;
 
-std::string percentText(double share) {
-  return page::shortNumber(std::round(std::abs(share) * 1000) / 10) + " %";
+/// In percent, with one decimal.
+double percentOf(double share) {
+  return std::round(std::abs(share) * 1000) / 10;
 }
 
 /// Uses the customary thresholds of effect sizes, in standard deviations.
@@ -89,12 +90,11 @@ std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast) {
 
 std::string changeText(const Comparison& one) {
   const std::string_view unit = unitOf(one.key.name);
-  std::string text = one.relative && *one.relative != 0
-                         ? percentText(*one.relative) + (one.difference > 0 ? " higher" : " lower")
-                     : one.difference > 0 ? "higher"
-                                          : "lower";
-  return text + " (" + page::figureText(one.before.mean, unit) + " → " +
-         page::figureText(one.after.mean, unit) + ")";
+  const double percent = percentOf(one.relative.value_or(0));
+  return (percent != 0 ? page::shortNumber(percent) + " % " : "") +
+         (one.difference > 0 ? "higher" : "lower") + " (" +
+         page::figureText(one.before.mean, unit) + " → " + page::figureText(one.after.mean, unit) +
+         ")";
 }
 
 void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
@@ -110,10 +110,9 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
   html.name(comparison.request.oldVersion);
   html.text(" to ");
   html.name(comparison.request.newVersion);
-  html.text(changes == 0 ? ", none of " + countText(comparison.comparisons.size()) +
-                               " statistics changed beyond what chance explains."
-                         : ", " + countText(changes) + " of " +
-                               countText(comparison.comparisons.size()) + " statistics changed:");
+  const std::string compared = counted(comparison.comparisons.size(), "statistic");
+  html.text(changes == 0 ? ", none of " + compared + " changed beyond what chance explains."
+                         : ", " + countText(changes) + " of " + compared + " changed:");
   html.end();
   if (changes != 0) html.begin("ul");
   for (std::size_t i = 0; i < std::min(changes, kMostSentences); ++i) {
@@ -181,7 +180,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   }
   if (!chart.rows.empty()) writeIntervals(html, chart);
   if (unchanged != 0) {
-    html.element("p", countText(unchanged) + " more statistics show no change beyond chance.",
+    html.element("p", counted(unchanged, "more statistic") + " without a change beyond chance.",
                  {{"class", "note"}});
   }
 
@@ -201,7 +200,8 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     table.cell(kindText(one.key.kind));
     table.cell(page::figureText(one.before.mean, unit));
     table.cell(page::figureText(one.after.mean, unit));
-    table.cell(one.effect ? page::shortNumber(std::round(*one.effect * 100) / 100) : "constant");
+    table.cell(one.effect ? page::shortNumber(std::round(*one.effect * 100) / 100 + 0.0)
+                          : "constant");
     table.cell(countText(one.before.devices) + " and " + countText(one.after.devices));
   }
   table.end();
@@ -216,7 +216,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
   const std::size_t leftOut = comparison.missing + comparison.tooFew + comparison.unfit;
   if (leftOut != 0) {
     html.element("p",
-                 "Left out: " + countText(leftOut) + (leftOut == 1 ? " statistic" : " statistics") +
+                 "Left out: " + counted(leftOut, "statistic") +
                      " not in both versions, of too few devices, or without a mean.",
                  {{"class", "note"}});
   }

@@ -101,10 +101,10 @@ std::string textOf(const FleetPage& page) {
     page::HtmlWriter& html = document.section("Statistics by version");
     writeStatistics(html, page.statistics);
     if (page.furtherStatistics != 0) {
-      html.element("p",
-                   "There are " + countText(page.furtherStatistics) +
-                       " more statistics; tavrel-fleet show prints each of them.",
-                   {{"class", "note"}});
+      html.element(
+          "p",
+          "tavrel-fleet show prints " + counted(page.furtherStatistics, "more statistic") + ".",
+          {{"class", "note"}});
     }
   }
   page::HtmlWriter& html = document.section("How to read this page");

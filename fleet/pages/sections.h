@@ -18,11 +18,13 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
 /// The short meaning of a key when it is known, else the key itself.
 std::string nameOf(std::string_view key);
 std::string_view unitOf(std::string_view key);
-/// "20 % higher (120 ms → 144 ms)".
+/// "20 % higher (120 ms → 144 ms)"; without the percentage when that rounds to 0.
 std::string changeText(const Comparison& one);
 /// "2 logs that have no mean, because ...".
 std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast);
 /// "1,234".
 std::string countText(std::size_t count);
+/// "1 statistic", "1,234 statistics".
+std::string counted(std::size_t count, const std::string& what);
 
 }  // namespace tavrel::fleet

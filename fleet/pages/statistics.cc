@@ -113,6 +113,10 @@ std::string countText(std::size_t count) {
   return text;
 }
 
+std::string counted(std::size_t count, const std::string& what) {
+  return countText(count) + " " + what + (count == 1 ? "" : "s");
+}
+
 void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
   for (const SummaryPart& part : summary.parts) {
     if (part.by == GroupBy::kOs) writeGroups(html, "OS versions", part, summary.devicesAtLeast);
@@ -173,9 +177,7 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
     html.end();
   }
   if (hidden != 0) {
-    html.element("p",
-                 "Not shown: " + countText(hidden) + (hidden == 1 ? " statistic" : " statistics") +
-                     " of too few devices.",
+    html.element("p", "Not shown: " + counted(hidden, "statistic") + " of too few devices.",
                  {{"class", "note"}});
   }
 }

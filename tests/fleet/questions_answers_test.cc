@@ -4,7 +4,7 @@
 #include <map>
 #include <random>
 
-#include "fleet/pages/fleet_page.h"
+#include "fleet/pages/sections.h"
 #include "fleet/questions/compare.h"
 #include "fleet/questions/grouping.h"
 #include "fleet/questions/show.h"
@@ -242,6 +242,14 @@ TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
           EXPECT_TRUE(a == b || ledger.hasEnough(differenceOf(*a, *b))) << subject;
   }
   EXPECT_GT(shown, 100u);
+}
+
+TEST(CompareTest, PutsSmallChangesInWords) {
+  Comparison one;
+  one.before.mean = one.after.mean = 5;
+  one.difference = -1e-9;
+  one.relative = -2e-10;
+  EXPECT_EQ(changeText(one), "lower (5 → 5)");
 }
 
 TEST(CompareTest, FindsWhatChangedAndOnlyThat) {

@@ -51,8 +51,10 @@ std::vector<LogRecord> records() {
       record.osVersion = isNew ? kNew : kOld;
       record.region = device < 13 ? "(other)" : device < 26 ? "" : device < 37 ? "AT" : "LI";
       record.whitelistDigest = isNew ? "b" : "a";
-      record.scalars = {{"com.norvane.ioreport.nvme0.used_pct", static_cast<std::int64_t>(device)},
-                        {"=sum", std::int64_t{1} << 60}};
+      record.scalars = {
+          {"com.norvane.ioreport.nvme0.used_pct", static_cast<std::int64_t>(device)},
+          {"=sum", std::int64_t{1} << 60},
+          {"almost", device == 0 ? -1 : static_cast<std::int64_t>(device / 2 * 1000)}};
       const double mean = 100 + 10 * noise(random) + (isNew ? 25 : 0);
       record.distributions = {{kSlow, {mean - 50, mean + 50.1, mean, 1e4 / 3, 7}},
                               {"=sum", {0, 1, device == 0 ? std::nan("") : mean, 1, 2}}};
@@ -144,7 +146,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_GT(first["lower"], 10);
   EXPECT_LT(first["upper"], 40);
   EXPECT_EQ(compared["comparisons"][1]["after"]["logs_without_mean"], 3);
-  EXPECT_EQ(compared["comparisons"][3]["effect"], 0);  // all logs are alike
+  EXPECT_EQ(compared["comparisons"][4]["effect"], 0);  // all logs are alike
   const auto shown =
       nlohmann::json::parse(run(file, {"show", kSlow, "--by", "region", "--json"}).out);
   const auto& side = shown["answers"][0]["sides"][0];
@@ -157,7 +159,8 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["above"], 100);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["at_most"], nullptr);
   EXPECT_THAT(run(file, {"compare", "4.9", "4.10"}).out,
-              HasSubstr("OS 4.9 (A) -> OS 4.10 (B), all days: 2 of 4 statistics changed\n"));
+              HasSubstr("OS 4.9 (A) -> OS 4.10 (B), all days: 2 of 5 statistics changed\n"));
+  EXPECT_EQ(run(file, {"compare", "4.9", "4.10", "--all"}).out.find(" -0 "), std::string::npos);
   const std::string csv = run(file, {"show", "=sum", "--by", "region", "--csv"}).out;
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,scalar,all days,all,,40,120,0,120,1152921504606846976,"
                              "1152921504606846976,1152921504606846976,0,0,1152921504606846976,,,"));
@@ -169,7 +172,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_THAT(buckets, HasSubstr(",all days,value,OS 4.10 (B),100,,180,180\r\n"));
 
   const std::string page = run(file, {"page", "-o", "-"}).out;
-  EXPECT_THAT(page, HasSubstr("2 of 4 statistics changed"));
+  EXPECT_THAT(page, HasSubstr("2 of 5 statistics changed"));
   const std::regex sentence("Chance alone would show");
   EXPECT_EQ(std::distance(std::sregex_iterator(page.begin(), page.end(), sentence), {}), 2);
   EXPECT_THAT(page, HasSubstr("Endurance used"));
