@@ -2,7 +2,10 @@
 
 #include <CLI/CLI.hpp>
 #include <exception>
+#include <string>
+#include <system_error>
 
+#include "base/format.h"
 #include "base/version.h"
 #include "fleet/commands/compare_command.h"
 #include "fleet/commands/completion_command.h"
@@ -32,6 +35,15 @@ void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) 
       .check(databaseFault);
 }
 
+// A thread that cannot be started says no more than that.
+std::string reasonOf(const std::exception& error) {
+  const auto* const system = dynamic_cast<const std::system_error*>(&error);
+  if (system == nullptr || system->code() != std::errc::resource_unavailable_try_again)
+    return error.what();
+  return format("cannot start a thread: %s: allow more processes (ulimit -u, TasksMax)",
+                system->code().message());
+}
+
 }  // namespace
 
 int runFleet(const std::vector<std::string>& arguments, const ToolStreams& streams) {
@@ -45,7 +57,7 @@ int runFleet(const std::vector<std::string>& arguments, const ToolStreams& strea
       add(top, context);
     runCommandLine(app, arguments, context);
   } catch (const std::exception& error) {
-    context.fail(error.what());
+    context.fail(reasonOf(error));
   }
   context.finish();
   return context.exitStatus();
