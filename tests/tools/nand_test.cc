@@ -313,8 +313,9 @@ TEST(NandFreezer, TakesAFileOrTheDevicesSnapshot) {
       nlohmann::json(
           {{"format_version", 1}, {key + "Error", "1"}, {key + "ErrorMessage", reason + "."}}));
   device.check("nand freezer", fails("no freezer writes: " + reason +
-                                     ": put a stack snapshot that holds the "
-                                     "thread VM_swapout at " +
+                                     ": put a stack snapshot whose first container holds the "
+                                     "thread VM_swapout, with complete IO statistics if it has "
+                                     "any, at " +
                                      device.path(path)));
   device.write(path, found);
   device.check("nand freezer", shown);
@@ -322,7 +323,7 @@ TEST(NandFreezer, TakesAFileOrTheDevicesSnapshot) {
   device.check("nand freezer -",
                fails("standard input: " + reason +
                      ": give a stack snapshot whose first container "
-                     "holds the thread VM_swapout"),
+                     "holds the thread VM_swapout, with complete IO statistics if it has any"),
                found.substr(0, 40));
 }
 
