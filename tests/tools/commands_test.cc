@@ -36,7 +36,23 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "Requires at most 1 options be given from [--string,--bool,--int,--float,--date,--plist]: "
        "see "
        "'tavrelctl prefs set --help'"},
-      {"log show --raw --json", "--raw excludes --json: see 'tavrelctl log show --help'"}};
+      {"log show --raw --json", "--raw excludes --json: see 'tavrelctl log show --help'"},
+      {CommandLine{"log", "preview", "--day", ""},
+       "--day: must not be empty: see 'tavrelctl log preview --help'"},
+      {CommandLine{"whitelist", "diff", "", ""},
+       "OLD: must not be empty: see 'tavrelctl whitelist diff --help'"},
+      {CommandLine{"whitelist", "check", ""},
+       "FILE: must not be empty: see 'tavrelctl whitelist check --help'"},
+      {CommandLine{"registry", "record", ""},
+       "FILE: must not be empty: see 'tavrelctl registry record --help'"},
+      {CommandLine{"records", "list", "--type", ""},
+       "--type: must not be empty: see 'tavrelctl records list --help'"},
+      {"records list --type 0x10",
+       "--type: not a type of records: 0x10: give a number such as 172: see 'tavrelctl records "
+       "list --help'"},
+      {"stat collect --seconds -1",
+       "--seconds: not a number of seconds: -1: give 0 or more: see 'tavrelctl stat collect "
+       "--help'"}};
   for (const auto& [command, error] : kCases)
     device.check(command, fails(error, 2));
   const std::string none = device.path("/none");

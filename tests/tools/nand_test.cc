@@ -248,7 +248,7 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
     return json["parser"].get<std::string>() + ' ' + json["counters"]["readStage"][0].dump();
   };
   EXPECT_EQ(counters("K3V", "4582603A5700", ""), "parseCountersAlgoGeneric 0");
-  EXPECT_EQ(counters("", "AGAD\x01",
+  EXPECT_EQ(counters("K", "AGAD\x01",
                      "tavrelctl: unrecognized hex character: g\n"
                      "tavrelctl: unrecognized hex character: \\x01\n"),
             "parseCounters1y 256");

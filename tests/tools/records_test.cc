@@ -58,7 +58,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
               "172-2026-11-27.jsonl: not an object with \"time\", \"type\" and \"record\"\n"}));
   EXPECT_EQ(device.run("records show --day 2026-11-02").out,
             all.out.substr(0, all.out.find('\n') + 1));
-  EXPECT_EQ(device.run("records show --type 176 --day 20784", "", 48).out,
+  EXPECT_EQ(device.run("records show --type 0176 --day 20784", "", 48).out,
             "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3…\n");
   EXPECT_EQ(device.json("records show --type 172", "", 1)["records"][0].dump(),
             nlohmann::json::parse(kEccLine).dump());

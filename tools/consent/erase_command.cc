@@ -241,11 +241,6 @@ void noteWhatStays(ToolContext& context, const Scope& scope, const Erased& erase
   }
 }
 
-// An empty variable in a script must not mean all days.
-std::string namesADay(const std::string& text) {
-  return text.empty() ? "names no day" : "";
-}
-
 void run(ToolContext& context, const Arguments& arguments) {
   const auto scope = scopeOf(context, arguments);
   if (!scope || !isConfirmed(context, *scope, arguments.yes)) return;
@@ -268,16 +263,12 @@ void addEraseCommand(Command app, ToolContext& context) {
   command.addFlag("--all", arguments->all,
                   "All statistics, records and logs, except logs that were sent");
   command.addOption("--key", arguments->prefix, "Only statistics whose keys begin with this")
-      .typeName("PREFIX")
-      .check([](const std::string& text) {
-        return text.empty() ? std::string("names no key; --all means everything") : std::string();
-      });
+      .typeName("PREFIX");
   command
       .addOption("--from", arguments->from,
                  "The first day: today, yesterday, a number or YYYY-MM-DD, UTC")
-      .typeName("DAY")
-      .check(namesADay);
-  command.addOption("--to", arguments->to, "The last day").typeName("DAY").check(namesADay);
+      .typeName("DAY");
+  command.addOption("--to", arguments->to, "The last day").typeName("DAY");
   command.addFlag("--yes", arguments->yes, "Do not ask");
   command.setFooter(
       "Without --key, the structured records of the days are erased too. Preferences stay. See\n"

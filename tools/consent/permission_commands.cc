@@ -184,10 +184,7 @@ void addAllowCommand(Command app, ToolContext& context) {
       .addOption("--from", arguments->from,
                  "The first day whose statistics may leave: today, yesterday, a number or "
                  "YYYY-MM-DD, UTC")
-      .typeName("DAY")
-      .check([](const std::string& text) {
-        return text.empty() ? std::string("names no day") : std::string();
-      });
+      .typeName("DAY");
   command.setFooter(
       "Nothing that was recorded before leaves the device, unless --from names an earlier day. "
       "See\n"

@@ -223,7 +223,7 @@ void addPrefsCommands(Command app, ToolContext& context) {
     return command;
   };
   const auto addDomain = [&](Command command) {
-    return command.addOption("DOMAIN", arguments->domain, "Preference domain");
+    return command.addOption("DOMAIN", arguments->domain, "Preference domain").notEmpty();
   };
   const auto addKey = [&](Command command) {
     command.addOption("KEY", arguments->key, "Preference key").required();

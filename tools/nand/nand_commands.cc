@@ -228,7 +228,7 @@ void addNandCommands(Command app, ToolContext& context) {
   const Command group = app.addGroup("nand", "Inspect the flash storage and its raw buffers");
   const auto arguments = std::make_shared<Arguments>();
   const auto addFile = [&](Command command, const char* what) {
-    return command.addOption("FILE", arguments->file, what);
+    return command.addOption("FILE", arguments->file, what).notEmpty();
   };
 
   const Command infoCommand = group.addCommand("info", "Show the health of the flash");

@@ -200,7 +200,8 @@ void addRegistryCommands(Command app, ToolContext& context) {
   recorded
       .addOption("FILE", arguments->file,
                  "Property list to write, in one step; - is standard output")
-      .required();
+      .required()
+      .notEmpty();
 }
 
 }  // namespace tavrel

@@ -1,12 +1,25 @@
 #include "tools/shared/command.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
 #include <cstdint>
 #include <optional>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
 namespace tavrel {
+namespace {
+
+// CLI11 reads 010 as octal.
+std::string withoutLeadingZeros(std::string text) {
+  const bool isDecimal =
+      std::ranges::all_of(text, [](char digit) { return digit >= '0' && digit <= '9'; });
+  if (isDecimal) text.erase(0, std::min(text.find_first_not_of('0'), text.size() - 1));
+  return text;
+}
+
+}  // namespace
 
 Option Option::required() const {
   option_->required();
@@ -33,6 +46,10 @@ Option Option::check(std::function<std::string(const std::string& text)> fault) 
   return *this;
 }
 
+Option Option::notEmpty() const {
+  return check([](const std::string& text) { return text.empty() ? "must not be empty" : ""; });
+}
+
 Option Option::excludes(const Option& other) const {
   option_->excludes(other.option_);
   return *this;
@@ -57,9 +74,13 @@ Command Command::addChoice(const char* heading) const {
 template <class Target>
 Option Command::addOption(const char* names, Target& target, const char* description) const {
   CLI::Option* const option = app_->add_option(names, target, description);
+  constexpr bool isInteger =
+      std::is_same_v<Target, std::uint32_t> || std::is_same_v<Target, std::optional<std::uint32_t>>;
+  if constexpr (isInteger) option->transform(withoutLeadingZeros);
+  if (names[0] != '-') return Option(*option);
   // Each use of the option takes one value; whatever follows is an argument.
-  if (names[0] == '-') option->allow_extra_args(false);
-  return Option(*option);
+  option->allow_extra_args(false);
+  return Option(*option).notEmpty();
 }
 template Option Command::addOption(const char*, std::string&, const char*) const;
 template Option Command::addOption(const char*, double&, const char*) const;

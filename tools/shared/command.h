@@ -35,6 +35,8 @@ class Option {
   Option oneOf(std::initializer_list<std::string> values) const;
   /// `fault` returns what is wrong with the text of a value, or an empty string.
   Option check(std::function<std::string(const std::string& text)> fault) const;
+  /// Refuses an empty value: in a script that is a variable without a value.
+  Option notEmpty() const;
   Option excludes(const Option& other) const;
 
  private:
@@ -51,8 +53,9 @@ class Command {
   /// A group of options under its own heading, of which at most one may be given.
   Command addChoice(const char* heading) const;
 
-  /// "-v,--verbose" is an option, "FILE" an argument. Targets may be std::string, double and 32-bit
-  /// unsigned integers, each also optional, and std::vector<std::string> for repeated arguments.
+  /// "-v,--verbose" is an option, whose value may not be empty; "FILE" is an argument. Targets may
+  /// be std::string, double, 32-bit unsigned integers, which are decimal and may be optional, and
+  /// std::vector<std::string> for repeated arguments.
   template <class Target>
   Option addOption(const char* names, Target& target, const char* description) const;
   Option addFlag(const char* names, bool& target, const char* description) const;

@@ -64,6 +64,11 @@ std::string periodFault(const std::string& text) {
   return format("not a number of seconds: %s: give 1 or more", text);
 }
 
+std::string secondsFault(const std::string& text) {
+  if (parseNumber<std::uint32_t>(text)) return {};
+  return format("not a number of seconds: %s: give 0 or more", text);
+}
+
 void addKey(Command command, Arguments& arguments) {
   command.addOption("KEY", arguments.key, "Name of the statistic").required();
 }
@@ -146,7 +151,8 @@ void addStatCommands(Command app, ToolContext& context) {
       });
   const Option seconds =
       collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
-          .typeName("N");
+          .typeName("N")
+          .check(secondsFault);
   const Option once =
       collected
           .addFlag("--once", arguments->once,

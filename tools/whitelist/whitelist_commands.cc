@@ -128,15 +128,21 @@ void addWhitelistCommands(Command app, ToolContext& context) {
   const Command checkCommand = group.addCommand(
       "check",
       "Report entries that have no effect or do not coarsen; exit status 1 if there are any");
-  checkCommand.addOption("FILE", arguments->file,
-                         "Whitelist (default: the device's own); - is standard input");
+  checkCommand
+      .addOption("FILE", arguments->file,
+                 "Whitelist (default: the device's own); - is standard input")
+      .notEmpty();
   context.addJsonOption(checkCommand);
   checkCommand.onRun([&context, arguments] { check(context, *arguments); });
 
   const Command diffCommand = group.addCommand(
       "diff", "Compare what two whitelists let out; exit status 1 if NEW lets out more than OLD");
-  diffCommand.addOption("OLD", arguments->files[0], "Whitelist; - is standard input").required();
-  diffCommand.addOption("NEW", arguments->files[1], "Whitelist; - is standard input").required();
+  diffCommand.addOption("OLD", arguments->files[0], "Whitelist; - is standard input")
+      .required()
+      .notEmpty();
+  diffCommand.addOption("NEW", arguments->files[1], "Whitelist; - is standard input")
+      .required()
+      .notEmpty();
   context.addJsonOption(diffCommand);
   diffCommand.onRun([&context, arguments] { diff(context, *arguments); });
 
