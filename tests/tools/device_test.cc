@@ -127,6 +127,11 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
                 "TaskingPayload": null},
     "LastOSUpdate": {"day": 20000, "version": "B1"},
     "next_run": "undoes the applied tasking and applies the scheduled one"})"_json);
+  const Outcome large =
+      device.run("tasking schedule -",
+                 R"({"TaskingID": "t3", "TaskingDigest": ")" + std::string(1U << 20, 'x') + "\"}");
+  EXPECT_EQ(large.status, 1);
+  EXPECT_EQ(large.out, "");
   device.check("tasking clear",
                prints("Removed scheduled tasking t2. Settings already applied stay in force.\n"));
   EXPECT_TRUE(device.run("tasking show").out.starts_with("Scheduled tasking: none\n"));

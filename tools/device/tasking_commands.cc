@@ -135,7 +135,11 @@ void show(ToolContext& context) {
 bool store(ToolContext& context, const plist::Value& tasking) {
   Preferences& preferences = context.preferences();
   preferences.ZTXPreferencesSetValue(kScheduledTaskingKey, tasking, kScheduleDomain);
-  if (preferences.ZTXPreferencesSynchronize(kScheduleDomain)) return true;
+  // A value that is too large for preferences is dropped, and the rest is written.
+  if (preferences.ZTXPreferencesSynchronize(kScheduleDomain) &&
+      preferences.ZTXPreferencesGetValue(kScheduledTaskingKey, kScheduleDomain) == tasking) {
+    return true;
+  }
   context.setExitStatus(kExitFailure);  // a note has said why
   return false;
 }
