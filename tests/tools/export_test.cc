@@ -21,9 +21,13 @@ std::string linesWith(const std::string& page, std::string_view begin) {
 
 TEST(LabelTest, AreDifferentForDifferentBytes) {
   const std::pair<std::string, std::string> kCases[] = {
-      {"com.example.a", "com.example.a"}, {"a\\b\"c", "a\\b\"c"},
-      {"ü\n\x7f\xff", "ü%0A%7F%FF"},      {"%0A", "%250A"},
-      {std::string(1, '\0'), "%00"},      {std::string(256, 'x'), std::string(256, 'x')}};
+      {"com.example.a", "com.example.a"},
+      {"a\\b\"c", "a\\b\"c"},
+      {"ü\n\x7f\xff", "ü%0A%7F%FF"},
+      {"%0A", "%250A"},
+      {"\xC2\x85", "%C2%85"},
+      {std::string(1, '\0'), "%00"},
+      {std::string(256, 'x'), std::string(256, 'x')}};
   for (const auto& [bytes, value] : kCases)
     EXPECT_EQ(labelValue(bytes), value);
   const std::string cut = labelValue(std::string(1000, 'x'));
@@ -93,13 +97,13 @@ TEST(ExportTest, IsAcceptedByBothParsers) {
             "tavrel_distribution{key=\"com.example.d\",quantile=\"0.99\"} 99\n"
             "tavrel_distribution_sum{key=\"com.example.d\"} 5050\n"
             "tavrel_distribution_count{key=\"com.example.d\"} 100\n"
-            "tavrel_distribution_count{key=\"com.example.n\"} 3\n"
             "tavrel_distribution_maximum{key=\"com.example.d\"} 100\n"
             "tavrel_distribution_maximum{key=\"com.example.n\"} +Inf\n"
             "tavrel_distribution_mean{key=\"com.example.d\"} 50.5\n"
             "tavrel_distribution_mean{key=\"com.example.n\"} +Inf\n"
             "tavrel_distribution_minimum{key=\"com.example.d\"} 1\n"
-            "tavrel_distribution_minimum{key=\"com.example.n\"} -3\n");
+            "tavrel_distribution_minimum{key=\"com.example.n\"} -3\n"
+            "tavrel_distribution_values{key=\"com.example.n\"} 3\n");
   EXPECT_EQ(linesWith(page, "tavrel_scalar{key=\"com."),
             "tavrel_scalar{key=\"com.example.\\\"\\\\%25\"} -5\n"
             "tavrel_scalar{key=\"com.example.s\"} 9007199254740993\n");
@@ -108,10 +112,10 @@ TEST(ExportTest, IsAcceptedByBothParsers) {
             "tavrel_disk_figure_bytes{disk=\"nvme0\",figure=\"written\"} 512\n"
             "tavrel_disk_figure_bytes{disk=\"nvme0\",figure=\"written_growth\"} 5\n"
             "tavrel_disk_figure_celsius{disk=\"nvme0\",figure=\"temperature\"} 41.5\n");
-  const std::string latency =
-      "{driver=\"flash0 <id 0x100000201>\",group=\"NAND\",subgroup="
-      "\"Latency\",channel=\"Read latency\"";
-  EXPECT_NE(page.find("_bucket" + latency + ",le=\"+Inf\"}"), page.npos);
+  EXPECT_NE(page.find("\ntavrel_channel_values{driver=\"flash0 <id 0x100000201>\",group=\"NAND\","
+                      "subgroup=\"Latency\",channel=\"Read latency\",up_to=\"+Inf\","
+                      "unit=\"seconds\"} 750\n"),
+            page.npos);
   EXPECT_NE(page.find("tavrel_check_state{check=\"queue\",subject=\"pending\"} 0\n"), page.npos);
   EXPECT_EQ(linesWith(page, "tavrel_metrics_left_out"), "tavrel_metrics_left_out 0\n");
   EXPECT_EQ(linesWith(device.run("export openmetrics --day yesterday").out, "tavrel_scalar"),

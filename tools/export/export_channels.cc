@@ -132,9 +132,21 @@ class ChannelExport {
     // The last bucket holds everything above the previous one.
     if (!point.buckets.empty())
       point.buckets.back().first = std::numeric_limits<double>::infinity();
-    if (isSumKnown) point.sum = sum;
+    if (!isSumKnown) return addBuckets(point);
+    point.sum = sum;
     page_.histogram(family("tavrel_channel_distribution", "Histograms of channels."), labels_,
                     point);
+  }
+
+  // A histogram without a sum.
+  void addBuckets(const HistogramPoint& point) {
+    for (const auto& [bound, count] : point.buckets) {
+      MetricLabels labels = with("up_to", boundOf(bound));
+      if (!unit_.empty()) labels.emplace_back("unit", unit_);
+      page_.gauge({"tavrel_channel_values", "",
+                   "How many values of a channel do not exceed a bound: histograms without a sum."},
+                  labels, static_cast<std::int64_t>(count));
+    }
   }
 
   std::optional<double> inUnit(std::int64_t value) const {

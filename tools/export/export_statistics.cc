@@ -17,6 +17,8 @@ const MetricFamily kDay{"tavrel_statistics_day_timestamp_seconds", "seconds",
 const MetricFamily kScalar{"tavrel_scalar", "", "Scalars of the day."};
 const MetricFamily kDistribution{"tavrel_distribution", "",
                                  "Distributions of the day: how many values, and what they are."};
+const MetricFamily kValues{"tavrel_distribution_values", "",
+                           "How many values a distribution of the day with a negative one has."};
 const MetricFamily kMinimum{"tavrel_distribution_minimum", "",
                             "Smallest value of a distribution of the day."};
 const MetricFamily kMaximum{"tavrel_distribution_maximum", "",
@@ -49,17 +51,16 @@ class DistributionExport {
     }
     if (enumerator.failed()) return;
     const MetricLabels labels{{"key", std::string(key)}};
-    SummaryPoint point{static_cast<std::uint64_t>(summary.numbers()), {}, {}};
-    if (summary.numbers() > 0) {
+    const std::int64_t count = summary.numbers();
+    if (count > 0) {
       page_.gauge(kMinimum, labels, summary.minimum());
       page_.gauge(kMaximum, labels, summary.maximum());
       page_.gauge(kMean, labels, summary.mean());
-      // In a summary, neither the sum nor a quantile may be negative.
-      if (summary.minimum() >= 0) {
-        if (std::isfinite(sum)) point.sum = sum;
-        point.quantiles = quantilesOf(key, summary.numbers());
-      }
     }
+    // In a summary, neither the sum nor a quantile may be negative.
+    if (count > 0 && summary.minimum() < 0) return page_.gauge(kValues, labels, count);
+    SummaryPoint point{static_cast<std::uint64_t>(count), sum, {}};
+    if (count > 0) point.quantiles = quantilesOf(key, count);
     page_.summary(kDistribution, labels, point);
   }
 

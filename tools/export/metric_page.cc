@@ -26,13 +26,6 @@ std::string numberOf(double value) {
   return numberText(value);
 }
 
-// A number within a label: OpenMetrics requires a fraction even for whole ones.
-std::string boundOf(double value) {
-  std::string text = numberOf(value);
-  if (text.find_first_of(".eIN") == std::string::npos) text += ".0";
-  return text;
-}
-
 // The labels without their braces.
 std::string textOf(const MetricLabels& labels) {
   std::string text;
@@ -67,10 +60,16 @@ std::string line(std::string_view name, std::string_view labels, std::string_vie
 
 }  // namespace
 
+std::string boundOf(double value) {
+  std::string text = numberOf(value);
+  if (text.find_first_of(".eIN") == std::string::npos) text += ".0";
+  return text;
+}
+
 std::string labelValue(std::string_view bytes) {
   constexpr std::string_view kCutMark = "%~";
   constexpr std::size_t kDigestBytes = 8;
-  constexpr std::size_t kLongestEscape = 4;
+  constexpr std::size_t kLongestEscape = 6;
   std::string value;
   for (std::string_view rest = bytes; !rest.empty();) {
     if (value.size() > kLongestLabel - kLongestEscape - kCutMark.size() - 2 * kDigestBytes &&
@@ -83,7 +82,7 @@ std::string labelValue(std::string_view bytes) {
     const char32_t point = takeCodePoint(rest);
     const std::string_view taken = before.substr(0, before.size() - rest.size());
     const bool isMalformed = point == kReplacementCharacter && taken.size() == 1;
-    if (point < 0x20 || point == 0x7F || point == '%' || isMalformed) {
+    if (point < 0x20 || (point >= 0x7F && point < 0xA0) || point == '%' || isMalformed) {
       appendEscaped(value, taken);
     } else {
       value += taken;
@@ -121,7 +120,7 @@ void MetricPage::summary(const MetricFamily& family, const MetricLabels& labels,
   for (const auto& [quantile, value] : point.quantiles) {
     lines += line(family.name, text, numberOf(value), "quantile=\"" + boundOf(quantile) + "\"");
   }
-  if (point.sum) lines += line(family.name + "_sum", text, numberOf(*point.sum));
+  lines += line(family.name + "_sum", text, numberOf(point.sum));
   lines += line(family.name + "_count", text, std::to_string(point.count));
   add(family, "summary", std::move(text), std::move(lines));
 }
@@ -135,10 +134,8 @@ void MetricPage::histogram(const MetricFamily& family, const MetricLabels& label
     lines +=
         line(family.name + "_bucket", text, std::to_string(count), "le=\"" + boundOf(bound) + "\"");
   }
-  // OpenMetrics allows sum and count only together.
-  if (point.sum) lines += line(family.name + "_sum", text, numberOf(*point.sum));
-  if (point.sum)
-    lines += line(family.name + "_count", text, std::to_string(point.buckets.back().second));
+  lines += line(family.name + "_sum", text, numberOf(point.sum));
+  lines += line(family.name + "_count", text, std::to_string(point.buckets.back().second));
   add(family, "histogram", std::move(text), std::move(lines));
 }
 

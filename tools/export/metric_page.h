@@ -12,7 +12,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <map>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <utility>
@@ -36,16 +35,21 @@ using MetricLabels = std::vector<std::pair<std::string_view, std::string>>;
 std::string labelValue(std::string_view bytes);
 inline constexpr std::size_t kLongestLabel = 256;
 
+/// A number as the value of a label: OpenMetrics requires a fraction even for whole ones.
+std::string boundOf(double value);
+
+// Both have a sum: readers such as node_exporter take an absent one for 0.
+
 struct SummaryPoint {
   std::uint64_t count = 0;
-  std::optional<double> sum;
+  double sum = 0;
   std::vector<std::pair<double, double>> quantiles;  // from 0 to 1, ascending, and their values
 };
 
 struct HistogramPoint {
   /// Upper bounds, ascending, and how many values do not exceed each. The last bound is infinity.
   std::vector<std::pair<double, std::uint64_t>> buckets;
-  std::optional<double> sum;
+  double sum = 0;
 };
 
 class MetricPage {
