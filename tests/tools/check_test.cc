@@ -84,6 +84,31 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
   EXPECT_EQ(device.runAt(device.path("/none"), "status --check").status, 3);
 }
 
+TEST_F(CheckTest, OutputThatCannotBePrintedHidesNoFinding) {
+  writeRun(kHour, true);
+  device.write("/w.plist", xmlOf("{}"));
+  const auto statusOf = [&](CommandLine command) {
+    std::istringstream in;
+    std::ostringstream error;
+    std::ostream out(nullptr);
+    command.insert(command.begin(), {"--root", device.path("")});
+    const int status = runTavrelctl(command, {.in = in, .out = out, .error = error});
+    EXPECT_EQ(error.str(),
+              "tavrelctl: cannot write standard output: free space or check the pipe\n");
+    return status;
+  };
+  const std::string file = device.path("/w.plist");
+  EXPECT_EQ(statusOf("log list"), 1);
+  EXPECT_EQ(statusOf("whitelist diff " + file + " " + file), 2);
+  EXPECT_EQ(statusOf("whitelist check " + file), 2);
+  EXPECT_EQ(statusOf("status --check"), 3);
+  device.write("/run/tavrel/health/nvme0.plist",
+               xmlOf(R"({"version": 1, "name": "nvme0", "kind": "nvme", "time": {"$date": ")" +
+                     isoAgo(kHour) + R"("}, "figures": {"critical_warning": 1}})"));
+  EXPECT_EQ(statusOf("status --check"), 2);
+  EXPECT_EQ(statusOf("disks"), 8 | 1);
+}
+
 TEST_F(CheckTest, TellsHowTheLastRunsWent) {
   const std::string run = "last-run: the daily run of day 20000 (2024-10-04)";
   expect("UNKNOWN last-run: no run yet", 3);

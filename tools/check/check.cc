@@ -1,7 +1,6 @@
 #include "tools/check/check.h"
 
 #include <algorithm>
-#include <exception>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
@@ -115,22 +114,18 @@ void print(ToolContext& context, const std::vector<Check>& checks) {
 
 void showChecks(ToolContext& context) {
   // A failure of this tool must not look like a warning to a monitoring system.
-  try {
-    const std::vector<Check> checks = checkDevice(context, kThoroughExamination);
-    const CheckState state = gravest(checks);
-    if (context.json()) {
-      Json list = Json::array();
-      for (const Check& check : checks)
-        list.push_back(jsonOf(check));
-      context.printJson({{"state", jsonNameOf(state)}, {"checks", std::move(list)}});
-    } else {
-      print(context, checks);
-    }
-    context.setExitStatus(static_cast<int>(state));
-  } catch (const std::exception& error) {
-    context.note(error.what());
-    context.setExitStatus(static_cast<int>(CheckState::Unknown));
+  context.setFailureStatus(static_cast<int>(CheckState::Unknown));
+  const std::vector<Check> checks = checkDevice(context, kThoroughExamination);
+  const CheckState state = gravest(checks);
+  if (context.json()) {
+    Json list = Json::array();
+    for (const Check& check : checks)
+      list.push_back(jsonOf(check));
+    context.printJson({{"state", jsonNameOf(state)}, {"checks", std::move(list)}});
+  } else {
+    print(context, checks);
   }
+  context.setExitStatus(static_cast<int>(state));
 }
 
 }  // namespace tavrel

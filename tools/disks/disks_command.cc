@@ -160,6 +160,8 @@ void showDisks(ToolContext& context, bool showsSources) {
     printTable(context, disks);
     if (showsSources) printFigures(context, disks);
   }
+  context.out().flush();
+  if (!context.out()) status |= kExitFailure;
   context.setExitStatus(status);
 }
 

@@ -81,7 +81,7 @@ void ToolOutput::note(std::string_view message) {
 
 void ToolOutput::fail(std::string_view message) {
   say(kErrorPriority, message);
-  exitStatus_ = kExitFailure;
+  exitStatus_ = failureStatus_;
 }
 
 void ToolOutput::failUsage(std::string_view message) {
@@ -91,7 +91,10 @@ void ToolOutput::failUsage(std::string_view message) {
 
 void ToolOutput::finish() {
   streams_.out.flush();
-  if (!streams_.out) fail("cannot write standard output: free space or check the pipe");
+  if (streams_.out) return;
+  const int found = exitStatus_;
+  fail("cannot write standard output: free space or check the pipe");
+  if (found != kExitSuccess) exitStatus_ = found;
 }
 
 }  // namespace tavrel

@@ -79,18 +79,21 @@ class ToolOutput {
 
   // -- Ends --------------------------------------------------------------------------------------
 
-  /// Prints "PROGRAM: MESSAGE" as one line on `error()` and sets the exit status to 1. The message
-  /// says what, where and what to do: "cannot read whitelist: /x: Permission denied: run as root".
+  /// Prints "PROGRAM: MESSAGE" as one line on `error()` and sets the exit status to 1, or that of
+  /// `setFailureStatus`. The message says what, where and what to do: "cannot read whitelist: /x:
+  /// Permission denied: run as root".
   void fail(std::string_view message);
   /// The same with exit status 2, for faulty arguments that only the subcommand can detect.
   void failUsage(std::string_view message);
   /// Prints a line without changing the exit status.
   void note(std::string_view message);
-  /// Fails when the output could not be written.
+  /// Fails when the output could not be written. An exit status other than 0 stays: it says more.
   void finish();
 
   int exitStatus() const { return exitStatus_; }
   void setExitStatus(int status) { exitStatus_ = status; }
+  /// For a subcommand whose exit status 1 is not a failure.
+  void setFailureStatus(int status) { failureStatus_ = status; }
 
  private:
   void say(char priority, std::string_view message);
@@ -99,6 +102,7 @@ class ToolOutput {
   ToolStreams streams_;
   bool json_ = false;
   int exitStatus_ = kExitSuccess;
+  int failureStatus_ = kExitFailure;
 };
 
 }  // namespace tavrel

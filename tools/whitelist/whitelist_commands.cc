@@ -52,8 +52,9 @@ Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file)
 
 // As for `diff` below: 1 means that there are findings, 2 that it could not look.
 void check(ToolContext& context, const Arguments& arguments) {
+  context.setFailureStatus(kExitUsage);
   const auto whitelist = readWhitelist(context, arguments.file);
-  if (!whitelist) return context.failUsage(whitelist.error().message);
+  if (!whitelist) return context.fail(whitelist.error().message);
   auto findings = checkWhitelist(whitelist->value);
   std::ranges::move(checkAgainstData(context, whitelist->value), std::back_inserter(findings));
   if (!findings.empty() && context.exitStatus() == kExitSuccess) {
@@ -81,12 +82,13 @@ void check(ToolContext& context, const Arguments& arguments) {
 
 // Like diff(1), exits with 2 when the files could not be compared.
 void diff(ToolContext& context, const Arguments& arguments) {
+  context.setFailureStatus(kExitUsage);
   std::vector<Whitelist> both;
   for (const std::string& file : arguments.files) {
     auto whitelist = readWhitelist(context, file);
-    if (!whitelist) return context.failUsage(whitelist.error().message);
+    if (!whitelist) return context.fail(whitelist.error().message);
     if (!whitelist->value.dictionary()) {
-      return context.failUsage(
+      return context.fail(
           format("%s: not a whitelist: its root must be a dictionary of groups", whitelist->name));
     }
     both.push_back(*std::move(whitelist));

@@ -97,7 +97,7 @@ std::optional<std::int32_t> dayToCheck(const std::vector<std::int32_t>& days, st
 std::vector<WhitelistFinding> checkAgainstData(ToolContext& context,
                                                const plist::Value& whitelist) {
   const auto fail = [&](const Error& error) {
-    context.failUsage(error.message + "; the whitelist is not checked against what is recorded");
+    context.fail(error.message + "; the whitelist is not checked against what is recorded");
   };
   auto history = context.storeForReading().openHistory();
   if (!history) {
