@@ -246,6 +246,14 @@ TEST_F(ReportTest, RegistryListsShowsAndRecords) {
   device.check("registry show flash0",
                fails("not an entry id: flash0: give a 64-bit number, decimal or with 0x", 2));
 
+  // A channel's memory must not take the number of the closed stream.
+  const std::string closed =
+      TAVREL_BUILD "/bin/tavrelctl --root " + device.path("") + " report sample 2>&1 >&-";
+  std::unique_ptr<FILE, int (*)(FILE*)> program(popen(closed.c_str(), "r"), pclose);
+  char line[80] = {};
+  EXPECT_NE(std::fgets(line, sizeof line, program.get()), nullptr);
+  EXPECT_STREQ(line, "tavrelctl: cannot write standard output: free space or check the pipe\n");
+
   device.check("registry record -", prints(example()));
   EXPECT_EQ(device.run("registry record " + device.path(kRecording)).status, 0);
   EXPECT_EQ(device.files()[0].second, example());

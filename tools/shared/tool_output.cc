@@ -1,6 +1,7 @@
 #include "tools/shared/tool_output.h"
 
 #include <cstdlib>
+#include <fcntl.h>
 #include <iostream>
 #include <nlohmann/json.hpp>
 #include <sys/ioctl.h>
@@ -23,6 +24,15 @@ std::optional<std::size_t> terminalColumns() {
   winsize size{};
   if (ioctl(STDOUT_FILENO, TIOCGWINSZ, &size) != 0 || size.ws_col == 0) return 80;
   return size.ws_col;
+}
+
+// If a standard stream is closed at the start, no file or socket may take its number and receive
+// what is printed. The modes are such that reading and printing fail, as they do without this.
+void holdStandardDescriptors() {
+  for (const int descriptor : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) {
+    if (fcntl(descriptor, F_GETFD) != -1) continue;
+    open("/dev/null", descriptor == STDIN_FILENO ? O_WRONLY : O_RDONLY);
+  }
 }
 
 // Follows NO_COLOR as no-color.org describes it.
@@ -50,6 +60,7 @@ std::string jsonText(const Json& value, int indent) {
 }
 
 ToolStreams standardStreams() {
+  holdStandardDescriptors();
   std::ios::sync_with_stdio(false);
   return {.in = std::cin,
           .out = std::cout,
