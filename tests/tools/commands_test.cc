@@ -253,6 +253,12 @@ TEST(LogList, SaysWhichLogCannotBeRead) {
   EXPECT_EQ(listed.error, format("tavrelctl: cannot use %s: it has more than %zu bytes; move it "
                                  "away; the day of such a log is not shown\n",
                                  path, limits::kPropertyListBytes));
+  device.fileLog(name, "<plist>\n", R"({"LogName": "log-tallied"})");
+  EXPECT_EQ(device.run("log list").error, "tavrelctl: damaged: 1 log, the first " + path +
+                                              ": 'tavrelctl log show' says what is wrong\n");
+  device.check("log show", fails(path + " is damaged: XML property list, line 2, column 1: no "
+                                        "element found: 'tavrelctl log show --raw' prints its "
+                                        "bytes"));
 }
 
 TEST(LogShow, SaysWhyThereIsNoLog) {
@@ -369,7 +375,7 @@ line two
   const std::string other = pending + "log-tallied-b.metadata.plist";
   device.write(kSubmission + "pending/log-tallied-a.log", xmlOf(R"json({
     "BHScalars": "x", "BHOther": 1, "BHDistributions": {"a": [{"$real": "nan"}, 1, 1, 1, 0], "b": 1},
-    "BHDistributionsHistogram": {"a": {"(1, 2]": "x"}, "c": {}}})json"));
+    "BHDistributionsHistogram": {"a": {"(1, 2]": "x", "(2, 3]": -1}, "c": {}}})json"));
   std::filesystem::copy_file(other, pending + "log-tallied-a.metadata.plist");
   std::filesystem::last_write_time(pending + "log-tallied-a.log",
                                    std::filesystem::last_write_time(pending + "log-tallied-b.log") +
@@ -378,13 +384,15 @@ line two
                                       "'tavrelctl log list' shows them"));
   const auto mistyped = device.json("log show")["log"];
   EXPECT_EQ(mistyped["distributions"]["a"]["minimum"], R"({"$real": "nan"})"_json);
+  EXPECT_FALSE(mistyped["distributions"]["a"].contains("histogram"));
   EXPECT_EQ(mistyped["faults"], R"([
       "BHDistributions/b: is not a summary of five numbers",
       "BHDistributionsHistogram/a/(1, 2]: is a string, not a number",
+      "BHDistributionsHistogram/a/(2, 3]: is negative",
       "BHDistributionsHistogram/c: has no summary in BHDistributions",
       "BHOther: is not part of a tallied log",
       "BHScalars: is a string, not a dictionary"])"_json);
-  EXPECT_NE(device.run("log show").out.find("\nFormat faults (5)\n  BHDistributions/b: is no"),
+  EXPECT_NE(device.run("log show").out.find("\nFormat faults (6)\n  BHDistributions/b: is no"),
             std::string::npos);
   device.check("log show " + other,
                fails("not a tallied log: " + other + ": 'tavrelctl plist show FILE' shows it"));

@@ -61,6 +61,11 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
 }
 
+bool isNamedAsDaily(const LogEnvelope& envelope) {
+  const std::string file = envelope.path.substr(envelope.path.rfind('/') + 1);
+  return envelope.metadata.string(kLogMetadataName).value_or(file).starts_with(kTalliedLogName);
+}
+
 // Logs of other kinds are texts in their own formats.
 void showText(ToolContext& context, const LogEnvelope& envelope, std::string_view bytes) {
   if (context.json()) {
@@ -99,6 +104,10 @@ void show(ToolContext& context, const Arguments& arguments) {
         format("not a tallied log: %s: 'tavrelctl plist show FILE' shows it", envelope->path));
   }
   if (value) return showDocument(context, *envelope, value->dictionary());
+  if (isNamedAsDaily(*envelope)) {
+    return context.fail(format("%s is damaged: %s: 'tavrelctl log show --raw' prints its bytes",
+                               envelope->path, value.error().message));
+  }
   if (bytes->find('\0') != std::string::npos || !isValidUtf8(*bytes)) {
     return context.fail(
         format("not a log: %s: it is neither a property list nor text: 'tavrelctl log list' shows "

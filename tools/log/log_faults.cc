@@ -47,8 +47,10 @@ void checkHistogram(const plist::Dictionary& summaries, const plist::Entry& hist
   const plist::Dictionary buckets = histogram.value.dictionary();
   if (!buckets) faults.push_back(notA(path, histogram.value, "a dictionary"));
   for (const plist::Entry& bucket : buckets) {
-    if (bucket.value.number()) continue;
-    faults.push_back(notA(format("%s/%s", path, bucket.key), bucket.value, "a number"));
+    const std::string place = format("%s/%s", path, bucket.key);
+    const auto count = bucket.value.number();
+    if (!count) faults.push_back(notA(place, bucket.value, "a number"));
+    if (count && count->real() < 0) faults.push_back(place + ": is negative");
   }
 }
 

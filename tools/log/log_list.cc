@@ -21,17 +21,31 @@
 namespace tavrel {
 namespace {
 
-// Metadata lacks the reported day, so reads the log. `unread` gets the first failure.
+/// What kept the days of logs from being read.
+struct Obstacles {
+  std::optional<Error> unread;  // the first failure
+  std::uint64_t damaged = 0;
+  std::string firstDamaged;
+};
+
+// Metadata lacks the reported day, so reads the log.
 std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
-                                    std::optional<Error>& unread) {
+                                    Obstacles& obstacles) {
   if (!log.metadata.string(kLogMetadataName).value_or(log.name).starts_with(kTalliedLogName)) {
     return std::nullopt;
   }
   const auto bytes =
       context.linuxPlatform().fileSystem().read(log.path, limits::kPropertyListBytes);
-  if (!bytes && !unread && FileSystem::status(log.path)) unread = bytes.error();
+  if (!bytes) {
+    if (!obstacles.unread && FileSystem::status(log.path)) obstacles.unread = bytes.error();
+    return std::nullopt;
+  }
   plist::PlistCoding propertyLists;
-  return bytes ? dayOfLog(*bytes, propertyLists) : std::nullopt;
+  const auto day = dayOfLog(*bytes, propertyLists);
+  if (!day && !plist::read(asBytes(*bytes)) && obstacles.damaged++ == 0) {
+    obstacles.firstDamaged = log.path;
+  }
+  return day;
 }
 
 // Nothing records whether a run was forced, but a gated run always reports the previous day.
@@ -54,10 +68,10 @@ void listLogs(ToolContext& context, std::size_t most) {
                {"PLACE"},
                {"FILE", Table::Align::Whole}});
   Json entries = Json::array();
-  std::optional<Error> unread;
+  Obstacles obstacles;
   for (const FiledLog& log : filed->logs) {
     const auto& status = log.status;
-    const auto day = readDay(context, log, unread);
+    const auto day = readDay(context, log, obstacles);
     const bool isForced = isSurelyForced(log, day);
     if (context.json()) {
       Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
@@ -83,7 +97,13 @@ void listLogs(ToolContext& context, std::size_t most) {
     context.out() << counted(filed->older, "older log") << " not shown: see --all\n";
   }
   if (filed->unseen) return context.fail(filed->unseen->message);
-  if (unread) context.fail(unread->message + "; the day of such a log is not shown");
+  if (obstacles.unread) {
+    context.fail(obstacles.unread->message + "; the day of such a log is not shown");
+  }
+  if (obstacles.damaged > 0) {
+    context.fail(format("damaged: %s, the first %s: 'tavrelctl log show' says what is wrong",
+                        counted(obstacles.damaged, "log"), obstacles.firstDamaged));
+  }
   noteMissingMetadata(context, filed->logs);
 }
 

@@ -28,7 +28,7 @@ std::vector<DistributionView::Bucket> bucketsOf(const plist::Dictionary& histogr
   std::vector<DistributionView::Bucket> buckets;
   for (const plist::Entry& entry : histogram) {
     const auto count = entry.value.number();
-    if (!count) continue;
+    if (!count || count->real() < 0) continue;
     buckets.push_back({std::string(entry.key.view()), static_cast<std::uint64_t>(count->int64())});
   }
   std::stable_sort(buckets.begin(), buckets.end(),
