@@ -142,8 +142,16 @@ TEST(Plist, ConvertsBetweenAllForms) {
   device.check("plist show " + file, prints("a:\n  [0] = 1\n  [1] = 2.5\nb = true\n"));
   EXPECT_EQ(device.json("plist show " + file)["value"], nlohmann::json::parse(json));
   device.check("plist convert - -o /dev/null",
-               fails("cannot write /dev/null: it is not a regular file: use -o - and redirect"),
+               fails("cannot write /dev/null: it is not a regular file: write to - and redirect"),
                json);
+  const std::string link = device.path("/link");
+  std::filesystem::create_symlink(file, link);
+  device.check("plist convert - -o " + link,
+               fails("cannot write " + link + ": it is a symbolic link: name its target"), json);
+  device.check("plist convert -",
+               fails("cannot write xml: standard input: it has text with control characters: use "
+                     "--to binary or --to json"),
+               R"({"a": ["\u0001"]})");
   device.check("plist convert - -o " + no + "/x",
                fails("cannot write " + no + "/x: " + no + ": No such file or directory"), json);
   EXPECT_FALSE(std::filesystem::exists(no));

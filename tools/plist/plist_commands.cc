@@ -10,6 +10,7 @@
 #include "tools/shared/input_file.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/output_file.h"
+#include "tools/shared/typed_value.h"
 #include "tools/shared/value_text.h"
 
 namespace tavrel {
@@ -39,10 +40,16 @@ Expected<std::string> encode(const plist::Value& value, const std::string& form)
 void convert(ToolContext& context, const Arguments& arguments) {
   const auto value = readDocument(context, arguments.file);
   if (!value) return context.fail(value.error().message);
+  const std::string name = arguments.file == "-" ? "standard input" : arguments.file;
+  if (arguments.form == "xml" && !hasXmlTextsOnly(*value)) {
+    return context.fail(format(
+        "cannot write xml: %s: it has text with control characters: use --to binary or --to json",
+        name));
+  }
   const auto bytes = encode(*value, arguments.form);
   if (!bytes) {
     return context.fail(
-        format("cannot write %s: %s: %s", arguments.form, arguments.file, bytes.error().message));
+        format("cannot write %s: %s: %s", arguments.form, name, bytes.error().message));
   }
   const auto written = writeOutput(context, arguments.output, *bytes);
   if (!written) context.fail(written.error().message);

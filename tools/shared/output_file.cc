@@ -15,11 +15,17 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
     output.out() << bytes;
     return Done{};
   }
-  if (file.empty()) return Error{"--output is empty: name a file, or - for standard output"};
   // Nobody intends to replace a device or a pipe with a file.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
-    return Error{format("cannot write %s: it is not a regular file: use -o - and redirect", file)};
+    return Error{
+        format("cannot write %s: it is not a regular file: write to - and redirect", file)};
+  }
+  // Replacing a link would leave its target as it was. Following it could replace a file that
+  // somebody else chose.
+  std::error_code ignored;
+  if (std::filesystem::is_symlink(file, ignored)) {
+    return Error{format("cannot write %s: it is a symbolic link: name its target", file)};
   }
   const auto path = std::filesystem::absolute(file);
   // A missing folder is probably a typing error, so do not make it.
