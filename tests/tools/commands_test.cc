@@ -448,6 +448,14 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");
   EXPECT_EQ(device.json("status")["store"]["bytes"],
             std::filesystem::file_size(store) + std::filesystem::file_size(store + "-wal"));
+
+  std::filesystem::remove(store);
+  std::filesystem::create_symlink("/none", store);
+  const Outcome linked = device.run("status");
+  EXPECT_NE(linked.out.find("\nStore            unreadable\n"), std::string::npos) << linked;
+  EXPECT_EQ(linked.error,
+            "tavrelctl: statistics store " + store + ": is a symbolic link: move it away\n");
+  EXPECT_NE(device.run("status --check").out.find("\nCRITICAL store: "), std::string::npos);
 }
 
 }  // namespace

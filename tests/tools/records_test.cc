@@ -70,6 +70,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
                {1, "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3]=9 t=[0.5]\n",
                 "tavrelctl: cannot read " + device.path(kRecords) +
                     "172-2026-11-27.jsonl: it is not a regular file\n"});
+  EXPECT_EQ(device.run("records show --type 172").out, "");
 }
 
 TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {

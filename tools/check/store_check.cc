@@ -3,6 +3,7 @@
 #include <cerrno>
 #include <cmath>
 #include <filesystem>
+#include <sys/stat.h>
 #include <sys/statvfs.h>
 #include <unistd.h>
 
@@ -62,8 +63,8 @@ void examine(CheckScene& scene, const std::string& path, Check& check) {
   const auto found = history ? (*history)->examine(scene.examination)
                              : Expected<SqliteHistory::Examination>(history.error());
   if (!found) {
-    const bool mayRead = access(path.c_str(), R_OK) == 0;
-    return addFinding(check, mayRead ? CheckState::Critical : CheckState::Unknown,
+    const bool isClosed = access(path.c_str(), R_OK) != 0 && errno == EACCES;
+    return addFinding(check, isClosed ? CheckState::Unknown : CheckState::Critical,
                       found.error().message);
   }
   if (!found->fault.empty()) {
@@ -99,7 +100,8 @@ void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
 void checkStore(CheckScene& scene) {
   Check check{"store"};
   const std::string& path = scene.context.storeForReading().path();
-  if (FileSystem::status(path)) {
+  struct stat status {};
+  if (lstat(path.c_str(), &status) == 0) {  // a link without a target is not "none yet"
     checkSize(scene, path, check);
     examine(scene, path, check);
   } else if (errno == ENOENT || errno == ENOTDIR) {

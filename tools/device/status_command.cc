@@ -59,13 +59,11 @@ DeviceStatus takeStatus(ToolContext& context) {
   status.isStateReadable = !context.hasComplaints();
   status.storePath = context.storeForReading().path();
   status.storeBytes = bytesOfStore(status.storePath);
-  if (status.storeBytes) {
-    const auto history = context.storeForReading().openHistory();
-    if (history) {
-      status.days = (*history)->daysHeld();
-    } else {
-      status.days = history.error();
-    }
+  const auto history = context.storeForReading().openHistory();
+  if (!history) {
+    status.days = history.error();
+  } else if (status.storeBytes) {
+    status.days = (*history)->daysHeld();
   }
   status.pending = device.submission().count(FileSubmission::Place::Pending);
   status.outbox = device.submission().count(FileSubmission::Place::Outbox);
@@ -104,7 +102,7 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
 }
 
 std::string storeText(const DeviceStatus& status) {
-  if (!status.storeBytes) return "none yet";
+  if (!status.storeBytes) return status.days ? "none yet" : "unreadable";
   std::string text = sizeText(static_cast<double>(*status.storeBytes));
   if (!status.days) return text + ", unreadable";
   if (!*status.days) return text + ", empty";

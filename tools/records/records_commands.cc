@@ -129,7 +129,7 @@ class RecordsView {
   void end() {
     if (document_) {
       document_->end();
-    } else if (!hasPrinted_ && !follows_) {
+    } else if (!hasPrinted_ && !follows_ && context_.exitStatus() == kExitSuccess) {
       context_.out() << "no records\n";
     }
   }
