@@ -106,7 +106,9 @@ Status foldEverything(ToolContext& context) {
     if (report.failure) return Error{*report.failure};
     if (report.waiting == 0) return Done{};
     if (report.waiting >= before) {
-      return Error{counted(report.waiting, "segment") + " cannot be folded now"};
+      return Error{counted(report.waiting, "segment") +
+                   " cannot be folded now: remove the cause that a line above names, or end the "
+                   "programs that record"};
     }
     before = report.waiting;
   }

@@ -1,6 +1,7 @@
 #include "tools/stat/value_recorder.h"
 
 #include <brimhold/client.h>
+#include <cerrno>
 #include <chrono>
 #include <cstdlib>
 #include <optional>
@@ -11,6 +12,7 @@
 #include "client/segment_format.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/files/system_error.h"
 #include "platform/linux/folding/recorders.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -134,6 +136,9 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
       return std::unique_ptr<ValueRecorder>(
           std::make_unique<StoreRecorder>(context.linuxPlatform().store()));
     case BHClientStatusNotAllowed:
+      if (access(folder.c_str(), W_OK) != 0 && errno == EROFS) {
+        return systemError("create files in", folder);
+      }
       return Error{
           format("cannot create files in %s: run as root or join the group brimhold", folder)};
     case BHClientStatusNoSpace:
