@@ -61,7 +61,7 @@ TEST(Limits, AKillAtAnyMomentLosesNothingThatStays) {
     device.write("/etc/tavrel/limits.plist",
                  xmlOf(R"({"Store": {"Days": 3}, "Pending": {"Days": 1}})"));
     for (const char* day : {"20260101", "20260102", "20260103"})
-      device.fileLog(format("pending/log-tallied-%sT000000Z-00000001", day), "L",
+      device.fileLog(format("pending/log-tallied-%sT000000Z-00000001", day), xmlOf("{}"),
                      R"({"LogName": "log-tallied"})");
     killed = runUntilSystemCall(calls, [&] { device.run("tidy"); });
 
