@@ -109,7 +109,7 @@ static struct Segment* mapSegment(int file) {
 }
 
 bool bhFetch(const void* from, size_t bytes) {
-  const size_t before = (uintptr_t)from & 4095U;
+  const size_t before = (uintptr_t)from & ((size_t)sysconf(_SC_PAGESIZE) - 1);
   int result;
   do {
     result = madvise((char*)from - before, before + bytes, MADV_POPULATE_WRITE);

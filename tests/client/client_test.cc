@@ -282,19 +282,22 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
 }
 
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {
-  std::filesystem::remove_all(folder);
-  std::filesystem::create_directories(folder);
   if (mount("test", folder.c_str(), "tmpfs", 0, "size=128k") != 0) GTEST_SKIP() << "not root";
-  run([] {
-    for (int i = 0; i < 20'000; ++i)
-      record(i);
-    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusFull);
-    BHClientScalarAdd(BHClientScalarForKey("too much"), 1);
-  });
-  fold();
-  EXPECT_GT(records["series"].size(), 5'000U);
-  expectEachOnce(records["series"], 20'000, dropped - 1);
-  EXPECT_TRUE(scalars.empty());
+  for (const bool isLarge : {false, true}) {
+    run([=] {
+      largePages = isLarge;
+      for (int i = 0; i < 20'000; ++i)
+        record(i);
+      EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusFull);
+      BHClientScalarAdd(BHClientScalarForKey("too much"), 1);
+    });
+    fold();
+    EXPECT_GT(records["series"].size(), 5'000U);
+    expectEachOnce(records["series"], 20'000, dropped - 1);
+    EXPECT_TRUE(scalars.empty());
+    records.clear();
+    dropped = 0;
+  }
   umount(folder.c_str());
 }
 

@@ -5,15 +5,41 @@
 #include <cstdlib>
 #include <ctime>
 
+namespace {
+constexpr std::size_t kLargePage = 16'384;
+}
+
 extern "C" {
 int __real_clock_gettime(clockid_t clock, timespec* now);
 int __wrap_clock_gettime(clockid_t clock, timespec* now);
 int __real_madvise(void* from, std::size_t bytes, int advice);
 int __wrap_madvise(void* from, std::size_t bytes, int advice);
+long __real_sysconf(int name);
+long __wrap_sysconf(int name);
+void* __real_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset);
+void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset);
 
 int __wrap_madvise(void* from, std::size_t bytes, int advice) {
   if (tavrel::whileFetching) tavrel::whileFetching();
+  if (tavrel::largePages && reinterpret_cast<std::uintptr_t>(from) % kLargePage != 0) {
+    errno = EINVAL;
+    return -1;
+  }
   return __real_madvise(from, bytes, advice);
+}
+
+long __wrap_sysconf(int name) {
+  return name == _SC_PAGESIZE && tavrel::largePages ? long{kLargePage} : __real_sysconf(name);
+}
+
+void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset) {
+  if (tavrel::largePages && from == nullptr) {
+    void* const room = __real_mmap(nullptr, bytes + kLargePage, PROT_NONE,
+                                   MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    from = static_cast<char*>(room) + -reinterpret_cast<std::uintptr_t>(room) % kLargePage;
+    flags |= MAP_FIXED;
+  }
+  return __real_mmap(from, bytes, access, flags, file, offset);
 }
 
 int __wrap_clock_gettime(clockid_t clock, timespec* now) {
@@ -34,6 +60,7 @@ int __wrap_clock_gettime(clockid_t clock, timespec* now) {
 namespace tavrel {
 
 std::function<void()> whileFetching;
+bool largePages = false;
 
 TestClock& testClock() {
   static TestClock& clock = shared<TestClock>();

@@ -40,6 +40,9 @@ TestClock& testClock();
 /// Called whenever libbrimhold allocates memory.
 extern std::function<void()> whileFetching;
 
+/// Whether the kernel seems to have pages of 16 KiB.
+extern bool largePages;
+
 /// Memory shared with children: they see changes.
 template <class T>
 T& shared() {
