@@ -50,12 +50,15 @@ static struct Cell* findKnown(struct State* state, struct Segment* segment, stru
   return NULL;
 }
 
-/* The number of a cell that has never been used; 0 when there is none. */
-static uint32_t takeCell(struct Process* process, struct Segment* segment) {
+/* The number of a cell that has never been used; 0 when there is none. A cell serves one key for
+ * ever. Undated values need a cell per second, so a part is kept from them: enough for a dated cell
+ * of every key. */
+static uint32_t takeCell(struct Process* process, struct Segment* segment, uint64_t start) {
+  const uint32_t limit = (start & kBHUndated) ? kBHCellCount - kBHKeys : kBHCellCount;
   uint32_t used = atomic_load(&segment->cellsUsed);
   do {
     if (used >= kBHCellCount * 3 / 4) bhAskForFold(process);
-    if (used >= kBHCellCount || !bhFetch(&segment->cells[used], sizeof(struct Cell))) return 0;
+    if (used >= limit || !bhFetch(&segment->cells[used], sizeof(struct Cell))) return 0;
   } while (!atomic_compare_exchange_weak(&segment->cellsUsed, &used, used + 1));
   return used + 1;
 }
@@ -70,7 +73,7 @@ static struct Cell* findOrMake(struct Process* process, struct Segment* segment,
     if (known) return known;
 
     const uint32_t keyNumber = bhNameKey(process, segment, key);
-    if (made == 0 && keyNumber != 0) made = takeCell(process, segment);
+    if (made == 0 && keyNumber != 0) made = takeCell(process, segment, start);
     if (made == 0) return NULL;
     struct Cell* cell = &segment->cells[made - 1];
     atomic_store(&cell->start, start);
@@ -85,12 +88,10 @@ static struct Cell* currentCell(struct Process* process, struct Segment* segment
   struct Cell* cell = atomic_load_explicit(&key->cell, memory_order_acquire);
   if (cell && atomic_load(&cell->start) == start) return cell;
   cell = findOrMake(process, segment, key, start);
-  if (!cell) {
-    bhDrop(process, segment);
-    return NULL;
-  }
+  /* Closed also when there is no other: after a fold, the key has at least this one. */
   struct Cell* left = atomic_exchange(&key->cell, cell);
   if (left && left != cell) closeCell(left);
+  if (!cell) bhDrop(process, segment);
   return cell;
 }
 

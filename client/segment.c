@@ -97,7 +97,7 @@ static const char* textOf(BHClientStatus status) {
     case BHClientStatusFailed:
       return "the system failed to create a file in /run/tavrel/stat: nothing is recorded";
     case BHClientStatusFull:
-      return "the segment is full: values are dropped until the next fold";
+      return "the segment is full: values are dropped until a fold makes room";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
              "bytes, has control characters, or is one more than a process may have";

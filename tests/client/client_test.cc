@@ -244,6 +244,34 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
   EXPECT_TRUE(segments().empty());
 }
 
+TEST_F(Recording, WithoutFreshCellsEachScalarKeepsOne) {
+  const pid_t child = start([] {
+    testClock().realtime = 1000;
+    for (int second = 1; second <= kBHCellCount - kBHKeys + 3; ++second) {
+      testClock().boot = second;
+      add(1);
+    }
+    for (int day = 0; day <= kBHKeys; ++day) {
+      testClock().realtime = (kToday + day) * 86'400;
+      if (day == 0) set(7);
+      add(1);
+    }
+    set(8);
+    kill(getpid(), SIGSTOP);
+    set(9);
+  });
+  waitpid(child, nullptr, WUNTRACED);
+  fold();
+  kill(child, SIGCONT);
+  EXPECT_EQ(waitFor(child), 0);
+  fold();
+  EXPECT_EQ(scalar("count", 0), kBHCellCount - kBHKeys);  // each second needs a cell
+  EXPECT_EQ(scalar("gauge"), 7);
+  EXPECT_EQ(scalar("gauge", kToday + kBHKeys), 9);
+  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys} + 2);
+  EXPECT_EQ(dropped, 6U);
+}
+
 TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   constexpr int kRoom = kBHChunkCount * kBHChunkRecords;
   const pid_t child = start([&] {
@@ -263,7 +291,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
     EXPECT_FALSE(isFoldWanted());  // only once
     const char* text = nullptr;
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusFull);
-    EXPECT_STREQ(text, "the segment is full: values are dropped until the next fold");
+    EXPECT_STREQ(text, "the segment is full: values are dropped until a fold makes room");
     kill(getpid(), SIGSTOP);
     for (i = 0; i < 100; ++i)
       record(i);

@@ -92,7 +92,7 @@ typedef enum BHClientStatus {
   BHClientStatusNoSpace = 5,     /* the tmpfs or a limit of the process is exhausted */
   BHClientStatusUnsupported = 6, /* the kernel lacks what the library needs (Linux 4.14) */
   BHClientStatusFailed = 7,      /* the system failed for another reason */
-  BHClientStatusFull = 8,        /* values are dropped until the system has folded */
+  BHClientStatusFull = 8,        /* values are dropped until a fold makes room */
   BHClientStatusKeyRefused = 9   /* values are kept, but a look-up was refused */
 } BHClientStatus;
 
