@@ -57,7 +57,7 @@ static uint32_t takeCell(struct Process* process, struct Segment* segment, uint6
   const uint32_t limit = (start & kBHUndated) ? kBHCellCount - kBHKeys : kBHCellCount;
   uint32_t used = atomic_load(&segment->cellsUsed);
   do {
-    if (used >= kBHCellCount * 3 / 4) bhAskForFold(process);
+    if (used >= kBHCellCount * 3 / 4) bhAskForFold(process, false);
     if (used >= limit || !bhFetch(&segment->cells[used], sizeof(struct Cell))) return 0;
   } while (!atomic_compare_exchange_weak(&segment->cellsUsed, &used, used + 1));
   return used + 1;

@@ -16,6 +16,11 @@ static uint32_t usedChunks(struct Segment* segment) {
   return used < kBHChunkCount ? used : kBHChunkCount;
 }
 
+static int32_t freeChunks(struct State* state, struct Segment* segment) {
+  return atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) + kBHChunkCount -
+         (int32_t)usedChunks(segment);
+}
+
 void bhNoticeFold(struct Process* process, struct Segment* segment) {
   struct State* state = process->state;
   const uint64_t folds = atomic_load_explicit(&segment->folds, memory_order_acquire);
@@ -25,7 +30,9 @@ void bhNoticeFold(struct Process* process, struct Segment* segment) {
     reusable += isReusable(&segment->chunks[i]);
   atomic_store_explicit(&state->reusableChunks, reusable, memory_order_relaxed);
   atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
-  atomic_store_explicit(&state->askedForFold, 0, memory_order_relaxed);
+  if (freeChunks(state, segment) >= kBHChunkCount / 2) {
+    atomic_store_explicit(&state->hasFreedChunks, 1, memory_order_relaxed);
+  }
   atomic_store_explicit(&state->knownFolds, folds, memory_order_relaxed);
 }
 
@@ -86,9 +93,10 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
   struct Chunk* chunk = atomic_exchange(&state->spareChunk, NULL);
   if (!chunk) chunk = takeReusable(state, segment);
   if (!chunk) chunk = takeFresh(state, segment);
-  const int32_t free = atomic_load_explicit(&state->reusableChunks, memory_order_relaxed) +
-                       kBHChunkCount - (int32_t)usedChunks(segment);
-  if (free < kBHChunkCount / 4) bhAskForFold(process);
+  /* A program that fills a segment faster than it may ask is served as long as folds make room. */
+  if (freeChunks(state, segment) < kBHChunkCount / 4) {
+    bhAskForFold(process, atomic_exchange(&state->hasFreedChunks, 0));
+  }
   if (chunk) atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
   return chunk;
 }

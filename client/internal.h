@@ -37,7 +37,8 @@ void bhForgetParent(void);
 void bhForgetInterrupted(struct Process* process, const struct Segment* segment);
 /* Allocates the pages: on a full tmpfs this call fails, and no later access raises SIGBUS. */
 bool bhFetch(const void* from, size_t bytes);
-void bhAskForFold(struct Process* process);
+/* Asks for a fold, unless it did so a short time ago and this is not urgent. */
+void bhAskForFold(struct Process* process, bool isUrgent);
 /* Counts a value for which there is no room. */
 void bhDrop(struct Process* process, struct Segment* segment);
 

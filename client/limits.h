@@ -19,6 +19,10 @@ enum {
    * the folder exists soon records, and one without a folder pays only a clock read per value. */
   kRetrySeconds = 5,
 
+  /* Seconds until a process asks for another fold. The first one may have failed, or made no room:
+   * each costs CPU time, and a write to flash. */
+  kAskSeconds = 60,
+
   /* Segments in the folder beyond which a new one asks for a fold: short-lived processes leave
    * one each, of 20 KiB. */
   kSegmentsBeforeFold = 256,

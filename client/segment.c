@@ -65,15 +65,20 @@ struct Segment* bhSegment(struct Process* process) {
   return begun;
 }
 
-void bhAskForFold(struct Process* process) {
-  if (atomic_exchange_explicit(&process->state->askedForFold, 1, memory_order_relaxed) == 0) {
+void bhAskForFold(struct Process* process, bool isUrgent) {
+  struct State* state = process->state;
+  const uint64_t now = bhSeconds(CLOCK_MONOTONIC_COARSE);
+  uint64_t mayAskAt = atomic_load_explicit(&state->mayAskAt, memory_order_relaxed);
+  if (now < mayAskAt && !isUrgent) return;
+  /* One of several threads asks. */
+  if (atomic_compare_exchange_strong(&state->mayAskAt, &mayAskAt, now + kAskSeconds)) {
     bhPostFoldWanted(process->folder);
   }
 }
 
 void bhDrop(struct Process* process, struct Segment* segment) {
   atomic_store_explicit(&process->state->isFull, 1, memory_order_relaxed);
-  bhAskForFold(process);
+  bhAskForFold(process, false);
   atomic_fetch_add_explicit(&segment->dropped, 1, memory_order_relaxed);
 }
 

@@ -276,6 +276,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   constexpr int kRoom = kBHChunkCount * kBHChunkRecords;
   const pid_t child = start([&] {
     const auto isFoldWanted = [&] { return std::filesystem::exists(folder / "fold-wanted"); };
+    testClock().coarse = 1000;
     int i = 0;
     // Nested signal handlers record while the second chunk is being taken.
     int handlers = 2;
@@ -289,24 +290,30 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
     for (; i < kRoom + 7; ++i)
       record(i);
     EXPECT_FALSE(isFoldWanted());  // only once
+    testClock().coarse += 60;
+    record(i);
+    EXPECT_TRUE(isFoldWanted());  // nothing has come of the first request
+    std::filesystem::remove(folder / "fold-wanted");
     const char* text = nullptr;
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusFull);
     EXPECT_STREQ(text, "the segment is full: values are dropped until a fold makes room");
     kill(getpid(), SIGSTOP);
-    for (i = 0; i < 100; ++i)
-      record(i);
+    i = 0;
+    while (!isFoldWanted() && i < kRoom)
+      record(i++);
+    EXPECT_NEAR(i, kRoom * 0.75, 2 * kBHChunkRecords);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
   });
   waitpid(child, nullptr, WUNTRACED);
   fold();
-  EXPECT_EQ(dropped, 7U);
+  EXPECT_EQ(dropped, 8U);
   expectEachOnce(records["series"], kRoom, 0);
   records.clear();
   kill(child, SIGCONT);
   EXPECT_EQ(waitFor(child), 0);
   fold();
-  EXPECT_EQ(dropped, 7U);
-  expectEachOnce(records["series"], 100, 0);
+  EXPECT_EQ(dropped, 8U);
+  expectEachOnce(records["series"], records["series"].size(), 0);
 }
 
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {

@@ -34,8 +34,8 @@ long __wrap_sysconf(int name) {
 
 void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset) {
   if (tavrel::largePages && from == nullptr) {
-    void* const room = __real_mmap(nullptr, bytes + kLargePage, PROT_NONE,
-                                   MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+    void* const room =
+        __real_mmap(nullptr, bytes + kLargePage, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
     from = static_cast<char*>(room) + -reinterpret_cast<std::uintptr_t>(room) % kLargePage;
     flags |= MAP_FIXED;
   }
@@ -47,7 +47,9 @@ int __wrap_clock_gettime(clockid_t clock, timespec* now) {
   if (auto* const whenRead = tavrel::testClock().whenRead.load(); isReal && whenRead) whenRead();
   const bool isBoot = clock == CLOCK_BOOTTIME;
   const bool isSteady = clock == CLOCK_MONOTONIC && tavrel::testClock().monotonic != 0;
+  const bool isCoarse = clock == CLOCK_MONOTONIC_COARSE;
   const std::int64_t seconds = isReal     ? tavrel::testClock().realtime.load()
+                               : isCoarse ? tavrel::testClock().coarse.load()
                                : isBoot   ? tavrel::testClock().boot.load()
                                : isSteady ? tavrel::testClock().monotonic += 10
                                           : 0;
@@ -91,6 +93,7 @@ Recording::Recording() {
   testClock().realtime = kToday * 86'400 + 3600;
   testClock().boot = 0;
   testClock().monotonic = 0;
+  testClock().coarse = 0;
 }
 
 Recording::~Recording() {

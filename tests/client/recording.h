@@ -33,6 +33,7 @@ struct TestClock {
   std::atomic<std::int64_t> realtime;
   std::atomic<std::int64_t> boot;
   std::atomic<std::int64_t> monotonic;
+  std::atomic<std::int64_t> coarse;  // the monotonic clock too, as libbrimhold reads it for itself
   std::atomic<void (*)()> whenRead;  // called before the real-time clock is shown
 };
 TestClock& testClock();
