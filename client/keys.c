@@ -62,12 +62,30 @@ static struct Key* refuse(void) {
   return &refusedKey;
 }
 
+/* The length of the character at the beginning of a text that ends with a zero. 0 when it is a
+ * control character, or not well-formed UTF-8: too long, a surrogate, or beyond U+10FFFF. */
+static size_t lengthOfCharacter(const unsigned char* text) {
+  const unsigned char first = text[0];
+  if (first < 0x80) return first >= ' ' && first != 127;
+  if (first < 0xc2 || first > 0xf4) return 0;
+  const size_t length = first < 0xe0 ? 2 : first < 0xf0 ? 3 : 4;
+  const unsigned char least = first == 0xe0 ? 0xa0 : first == 0xf0 ? 0x90 : 0x80;
+  const unsigned char most = first == 0xed ? 0x9f : first == 0xf4 ? 0x8f : 0xbf;
+  if (text[1] < least || text[1] > most) return 0;
+  for (size_t i = 2; i < length; ++i) {
+    if (text[i] < 0x80 || text[i] > 0xbf) return 0;
+  }
+  return length;
+}
+
 /* The length of a name, 0 for an invalid one. */
 static size_t lengthOfName(const char* name) {
   const size_t length = name ? strnlen(name, kBHLongestName + 1) : 0;
   if (length > kBHLongestName) return 0;
-  for (size_t i = 0; i < length; ++i) {
-    if ((unsigned char)name[i] < ' ' || name[i] == 127) return 0;
+  for (size_t at = 0; at < length;) {
+    const size_t step = lengthOfCharacter((const unsigned char*)name + at);
+    if (step == 0) return 0;
+    at += step;
   }
   return length;
 }

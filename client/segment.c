@@ -105,7 +105,8 @@ static const char* textOf(BHClientStatus status) {
       return "the segment is full: values are dropped until a fold makes room";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
-             "bytes, has control characters, or is one more than a process may have";
+             "bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or 256 KiB of "
+             "names that a process may have";
   }
   return "unknown status";
 }

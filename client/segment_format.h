@@ -115,7 +115,7 @@ enum {
   kBHKindScalar = 1,
   kBHKindDistribution = 2,
 
-  /* Bytes of a name, which has no control characters. */
+  /* Bytes of a name, which is UTF-8 without control characters. */
   kBHLongestName = 1024,
 
   kBHSecondsPerDay = 86400

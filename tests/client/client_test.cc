@@ -435,7 +435,12 @@ TEST_F(Recording, TimersMeasureSecondsAndMilliseconds) {
 }
 
 TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
-  run([] {
+  // The first and last characters of each length.
+  const char* const border =
+      " ~\xc2\x80\xdf\xbf\xe0\xa0\x80\xed\x9f\xbf"
+      "\xee\x80\x80\xef\xbf\xbf\xf0\x90\x80\x80\xf4\x8f\xbf\xbf";
+  run([=] {
+    BHClientDistributionRecord(BHClientDistributionForKey(border), 1);
     EXPECT_EQ(BHClientScalarForKey("a"), BHClientScalarForKey(std::string("a").c_str()));
     EXPECT_NE(BHClientScalarForKey("a"), BHClientScalarForKey("b"));
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
@@ -443,7 +448,9 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
     const std::string tooLong(1025, 'k');
     for (const char* name :
-         {static_cast<const char*>(nullptr), "", tooLong.c_str(), "two\nlines"}) {
+         {static_cast<const char*>(nullptr), "", tooLong.c_str(), "two\nlines", "\x7f", "\x80",
+          "\xc1\x81", "\xc3", "\xc3(", "\xe0\x9f\xbf", "\xe2\x82", "\xed\xa0\x80",
+          "\xf0\x8f\xbf\xbf", "\xf1\x80\x80\xc0", "\xf4\x90\x80\x80", "\xf5\x80\x80\x80"}) {
       BHClientScalarAdd(BHClientScalarForKey(name), 1);
       BHClientDistributionRecord(BHClientDistributionForKey(name), 1);
     }
@@ -451,13 +458,18 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
     BHClientDistributionRecord(nullptr, 1);
     for (int i = 0; i < kBHKeys + 10; ++i)
       BHClientScalarAdd(BHClientScalarForKey(std::to_string(i).c_str()), i);
-    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusKeyRefused);
+    const char* text = nullptr;
+    EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusKeyRefused);
+    EXPECT_STREQ(text,
+                 "values are recorded, except those of a refused key: it is empty, longer than "
+                 "1024 bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or "
+                 "256 KiB of names that a process may have");
   });
   fold();
-  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 3});  // "a", "b" and 0 leave nothing
+  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4});  // "a", "b" and 0 leave nothing
   EXPECT_EQ(scalar(std::string(1024, 'k').c_str()), 4);
   EXPECT_EQ(scalar("4000"), 4000);
-  EXPECT_TRUE(records.empty());
+  EXPECT_EQ(records, (decltype(records){{border, {1}}}));
 }
 
 TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {

@@ -54,8 +54,8 @@ typedef struct BHClientDistributionKey BHClientDistributionKey;
 
 /* Looks up a key; the same name gives the same handle. The name is copied. Never returns NULL: the
  * values of a refused key are dropped. A key is refused when it is NULL, empty or longer than 1024
- * bytes, has control characters, or the process has 4096 keys already. The other calls accept NULL,
- * and drop the value. */
+ * bytes, has control characters or is not UTF-8, or when the process would have more than 4096 keys
+ * or 256 KiB of names. The other calls accept NULL, and drop the value. */
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 
