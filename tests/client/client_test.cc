@@ -8,6 +8,7 @@
 #include <sys/time.h>
 #include <thread>
 
+#include "brimhold/client.hpp"
 #include "recording.h"
 
 namespace tavrel {
@@ -454,6 +455,8 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
       BHClientScalarAdd(BHClientScalarForKey(name), 1);
       BHClientDistributionRecord(BHClientDistributionForKey(name), 1);
     }
+    brimhold::Scalar(std::string("a\0b", 3)).add();
+    brimhold::Distribution(std::string("a\0b", 3)).record(1);
     BHClientScalarSet(nullptr, 1);
     BHClientDistributionRecord(nullptr, 1);
     for (int i = 0; i < kBHKeys + 10; ++i)

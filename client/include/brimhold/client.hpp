@@ -14,11 +14,18 @@
 
 namespace brimhold {
 
+namespace detail {
+// The library would take the text only up to a zero in it. An empty key is refused.
+inline const char* wholeKey(const std::string& key) {
+  return key.find('\0') == std::string::npos ? key.c_str() : "";
+}
+}  // namespace detail
+
 /// A number per UTC day. Cheap to copy.
 class Scalar {
  public:
   explicit Scalar(const char* key) : key_(BHClientScalarForKey(key)) {}
-  explicit Scalar(const std::string& key) : Scalar(key.c_str()) {}
+  explicit Scalar(const std::string& key) : Scalar(detail::wholeKey(key)) {}
 
   void add(std::int64_t amount = 1) const noexcept { BHClientScalarAdd(key_, amount); }
   void set(std::int64_t value) const noexcept { BHClientScalarSet(key_, value); }
@@ -31,7 +38,7 @@ class Scalar {
 class Distribution {
  public:
   explicit Distribution(const char* key) : key_(BHClientDistributionForKey(key)) {}
-  explicit Distribution(const std::string& key) : Distribution(key.c_str()) {}
+  explicit Distribution(const std::string& key) : Distribution(detail::wholeKey(key)) {}
 
   void record(double value) const noexcept { BHClientDistributionRecord(key_, value); }
 
