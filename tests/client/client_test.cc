@@ -1,3 +1,5 @@
+#include "brimhold/client.hpp"
+
 #include <algorithm>
 #include <barrier>
 #include <csignal>
@@ -8,7 +10,6 @@
 #include <sys/time.h>
 #include <thread>
 
-#include "brimhold/client.hpp"
 #include "recording.h"
 
 namespace tavrel {

@@ -258,8 +258,14 @@ TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurn) {
     }
   }
   for (const std::uint64_t waiting :
-       {kSegments - limits::kSegmentsPerUser, std::uint64_t{100}, std::uint64_t{0}})
+       {kSegments - limits::kSegmentsPerUser, std::uint64_t{100}, std::uint64_t{0}}) {
     EXPECT_EQ(foldNow().waiting, waiting);
+    if (waiting > 100) {
+      EXPECT_EQ(log.lines, Lines{"segments of user " + std::to_string(geteuid()) +
+                                 " wait: there are more than a fold takes; record from fewer "
+                                 "programs at a time"});
+    }
+  }
   look();
   EXPECT_EQ(scalar("count"), kSegments);
 }
@@ -311,8 +317,13 @@ TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
     ASSERT_EQ(pwrite(file, &cellsUsed, sizeof cellsUsed, kBHHeaderCellsUsed), 4);
     ASSERT_EQ(pwrite(file, cells.data(), cells.size(), kBHCells), std::ssize(cells));
   }
-  for (int fold = 0; fold < 2; ++fold)
+  Lines expected{"segments of user " + std::to_string(geteuid()) +
+                 " wait: what must be remembered of segments that are in use exceeds 1 MiB; record "
+                 "fewer keys, or from fewer programs at a time"};
+  for (int fold = 0; fold < 2; ++fold, expected.clear()) {
     EXPECT_EQ(foldNow().waiting, 3U);  // each position has 163,864 bytes, of 1 MiB
+    EXPECT_EQ(log.lines, expected);
+  }
   writers.clear();
   EXPECT_EQ(foldNow().removed, 9U);
 }

@@ -25,6 +25,16 @@ namespace {
 constexpr std::int64_t kRowBytes = 160;
 constexpr std::int64_t kValueBytes = 12;
 
+// Why the segments of a user wait for a later fold.
+constexpr std::string_view kManySegments =
+    "there are more than a fold takes; record from fewer programs at a time";
+constexpr std::string_view kManyValues =
+    "the fold has taken as many measurements as it may; record fewer, or fold more often";
+constexpr std::string_view kLargePositions =
+    "what must be remembered of segments that are in use exceeds 1 MiB; record fewer keys, or from "
+    "fewer programs at a time";
+static_assert(limits::kPositionBytesPerUser == 1U << 20);
+
 struct LessName {
   bool operator()(const SegmentName& a, const SegmentName& b) const {
     return std::pair(a.owner, a.identity) < std::pair(b.owner, b.identity);
@@ -68,6 +78,8 @@ class FoldRun {
                     const SegmentName& name, bool isWriterGone);
   Status dropPositions(SqliteBatch& batch);
   bool mustWait(const SegmentName& name);
+  /// Says that segments of a user exceed a limit. `limit` says which, and what to do.
+  void tellOfLimit(std::uint32_t owner, std::string_view limit);
   bool isStoreFull() const;
   Expected<bool> hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner, std::size_t before,
                                     std::size_t most);
@@ -106,6 +118,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   for (const auto& [owner, count] : listing.leftOut) {
     unseen_.insert(owner);
     report_.waiting += count;
+    tellOfLimit(owner, kManySegments);
   }
   unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
@@ -126,6 +139,10 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
     finishSegments();
   } while (next_ < listing.segments.size() || !removed_.empty());
   return Done{};
+}
+
+void FoldRun::tellOfLimit(std::uint32_t owner, std::string_view limit) {
+  notes_.tell(format("segments of user %u wait: %s", owner, limit));
 }
 
 void FoldRun::refuse(std::string_view line) {
@@ -225,10 +242,12 @@ bool FoldRun::mustWait(const SegmentName& name) {
   std::uint64_t& ofUser = values_[name.owner];
   if (ofUser >= limits::kFoldValuesPerUser ||
       report_.values + counts_.values >= limits::kFoldValues) {
+    tellOfLimit(name.owner, kManyValues);
     return true;
   }
-  if (known_->contains(name)) return false;
-  return ++positions_[name.owner] > limits::kSegmentsPerUser;
+  if (known_->contains(name) || ++positions_[name.owner] <= limits::kSegmentsPerUser) return false;
+  tellOfLimit(name.owner, kManySegments);
+  return true;
 }
 
 // Whether the position of a segment may grow from `before` to `most` bytes.
@@ -276,6 +295,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
         hasRoomForPosition(batch, name.owner, before.size(), reader.positionBytes());
     if (!hasRoom) return hasRoom.error();
     if (!*hasRoom) {
+      tellOfLimit(name.owner, kLargePositions);
       ++report_.waiting;
       return Done{};
     }
