@@ -87,6 +87,14 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   mkfifo((folder / "pipe.segment").c_str(), 0666);
   std::filesystem::create_directory(folder / "folder.segment");
   std::filesystem::create_directory(folder / "fold-wanted");
+  Lines lines;
+  {
+    LinuxPlatform other((DeviceRoot(root)));
+    const auto lock = other.store().beginBatch();
+    ASSERT_TRUE((*lock)->segmentNames());
+    EXPECT_TRUE(foldNow().failure);  // it tells of files that it cannot count
+    lines = log.lines;
+  }
   FoldReport report = foldNow();
   EXPECT_EQ(report.segmentsRefused, 7U);
   EXPECT_EQ(report.scalars, 1U);
@@ -102,8 +110,10 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
            {"folder.segment", "not a regular file"}})
     expected.push_back(std::string("\"") + name + place + reason + "; remove it");
   std::sort(expected.begin(), expected.end());
-  std::sort(log.lines.begin(), log.lines.end());
-  EXPECT_EQ(log.lines, expected);
+  EXPECT_NE(lines, Lines());
+  lines.insert(lines.end(), log.lines.begin(), log.lines.end());
+  std::sort(lines.begin(), lines.end());
+  EXPECT_EQ(lines, expected);
   EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
   std::filesystem::create_directories(folder / "fold-wanted/x");
   EXPECT_EQ(foldNow().segmentsRefused, 1U);
@@ -124,7 +134,7 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
 
   // Once others have used up the room for remembering refusals, these count every time.
   std::ofstream told(root / "run/tavrel/fold.lock");
-  for (std::uint64_t i = 0; i < 8192; ++i)
+  for (std::uint64_t i = 0; i <= 8192; ++i)
     told.write(reinterpret_cast<const char*>(&i), sizeof i);
   told.close();
   for (int time = 0; time < 2; ++time) {

@@ -29,10 +29,11 @@ Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, S
 }
 
 FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), log_(log) {
-  std::string content(kRemembered * sizeof(std::uint64_t), '\0');
+  std::string content((1 + kRemembered) * sizeof(std::uint64_t), '\0');
   const ssize_t size = pread(file_.get(), content.data(), content.size(), 0);
   content.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
-  for (std::size_t at = 0; at + 8 <= content.size(); at += 8)
+  uncountedFiles_ = loadLittle64(asBytes(content), 0).value_or(0);
+  for (std::size_t at = 8; at + 8 <= content.size(); at += 8)
     told_.insert(*loadLittle64(asBytes(content), at));
 }
 
@@ -48,6 +49,17 @@ bool FoldNotes::tell(std::string_view line) {
     ++leftOut_;
   }
   return true;
+}
+
+void FoldNotes::refuse(std::string_view line) {
+  if (!tell(line)) return;
+  ++uncountedFiles_;
+  hasChanged_ = true;
+}
+
+void FoldNotes::clearUncountedFiles() {
+  hasChanged_ = hasChanged_ || uncountedFiles_ > 0;
+  uncountedFiles_ = 0;
 }
 
 void FoldNotes::mark() {
@@ -69,11 +81,14 @@ void FoldNotes::save() {
   }
   if (!hasChanged_) return;
   std::string content;
-  for (const std::uint64_t told : told_) {
+  const auto append = [&](std::uint64_t word) {
     std::array<std::byte, 8> bytes;
-    storeLittle64(bytes, 0, told);
+    storeLittle64(bytes, 0, word);
     content += asText(bytes);
-  }
+  };
+  append(uncountedFiles_);
+  for (const std::uint64_t told : told_)
+    append(told);
   if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
     log_.log(LogLevel::Error, "cannot write %s: refusals will be logged again", kLockPath);
   }

@@ -2,7 +2,8 @@
 // already.
 //
 // A refused file stays where it is, so every fold meets it again. The lock file, which lives until
-// the device restarts, remembers which lines were logged.
+// the device restarts, remembers which lines were logged, and how many refused files await being
+// counted in the store.
 #pragma once
 
 #include <cstdint>
@@ -28,6 +29,13 @@ class FoldNotes {
   /// many are remembered to know.
   bool tell(std::string_view line);
 
+  /// The same about a refused file, which is counted when `tell` is true.
+  void refuse(std::string_view line);
+  /// Refused files that no store counts yet, with those of earlier folds, which failed.
+  std::uint64_t uncountedFiles() const { return uncountedFiles_; }
+  /// After the commit that counts them.
+  void clearUncountedFiles();
+
   /// Marks that a transaction has taken values. Call it before the segments lose them.
   void mark();
   /// The time of the last mark, for readers of the store and then the segments: when it is the same
@@ -43,6 +51,7 @@ class FoldNotes {
   Descriptor file_;
   SystemLog& log_;
   std::unordered_set<std::uint64_t> told_;  // first 8 bytes of the lines' SHA-256
+  std::uint64_t uncountedFiles_ = 0;
   bool hasChanged_ = false;
   std::uint64_t leftOut_ = 0;
 };

@@ -53,23 +53,18 @@ struct FoldedSegment {
 class FoldRun {
  public:
   /// `storeBytes`: a store larger than this takes nothing from users other than root.
-  /// `refusedEarlier`: refused segments that are noted but not yet counted in a store.
   FoldRun(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
-          const Recorders& recorders, FoldReport& report, std::int64_t storeBytes,
-          std::uint64_t refusedEarlier)
+          const Recorders& recorders, FoldReport& report, std::int64_t storeBytes)
       : folder_(folder),
         store_(store),
         notes_(notes),
         recorders_(recorders),
         report_(report),
-        storeBytes_(storeBytes) {
-    counts_.segmentsRefused = refusedEarlier;
-  }
+        storeBytes_(storeBytes) {}
 
   Status run(const SegmentFolder::Listing& listing);
   /// Whether the run failed on a damaged store, which is now set aside.
   bool hasReplacedStore() const { return hasReplacedStore_; }
-  std::uint64_t refusedSegments() const { return counts_.segmentsRefused; }
 
  private:
   Status fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing);
@@ -83,7 +78,6 @@ class FoldRun {
   bool isStoreFull() const;
   Expected<bool> hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner, std::size_t before,
                                     std::size_t most);
-  void refuse(std::string_view line);
   void finishSegments();
 
   const SegmentFolder& folder_;
@@ -122,8 +116,8 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   }
   unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
-    refuse(line);
-  if (listing.segments.empty() && counts_.segmentsRefused == 0) return Done{};
+    notes_.refuse(line);
+  if (listing.segments.empty() && notes_.uncountedFiles() == 0) return Done{};
   do {
     auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
@@ -143,10 +137,6 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
 
 void FoldRun::tellOfLimit(std::uint32_t owner, std::string_view limit) {
   notes_.tell(format("segments of user %u wait: %s", owner, limit));
-}
-
-void FoldRun::refuse(std::string_view line) {
-  if (notes_.tell(line)) ++counts_.segmentsRefused;
 }
 
 Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing) {
@@ -179,7 +169,7 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
   const std::pair<const char*, std::uint64_t> figures[] = {
       {"com.norvane.brimhold.dropped", counts_.dropped},
       {"com.norvane.brimhold.refused", counts_.refused},
-      {"com.norvane.brimhold.segments_refused", counts_.segmentsRefused},
+      {"com.norvane.brimhold.segments_refused", notes_.uncountedFiles()},
   };
   ScalarChanges own;
   for (const auto& [key, count] : figures) {
@@ -194,7 +184,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   if (!opening->segment) {
     if (opening->refusal.empty()) return Done{};
     unseen_.insert(entry.owner);
-    refuse(opening->refusal);
+    notes_.refuse(opening->refusal);
     return Done{};
   }
   OpenSegment& segment = *opening->segment;
@@ -206,7 +196,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state) {
-    refuse(folder_.refusal(entry.name, state.error().message));
+    notes_.refuse(folder_.refusal(entry.name, state.error().message));
     return Done{};
   }
   if (*state == SegmentReader::State::Empty) {
@@ -216,7 +206,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   // Read again: at the first read, the process may not have written them yet.
   const SegmentName name{owner, reader.facts().identity};
   if (!found_.insert(name).second) {
-    refuse(folder_.refusal(entry.name, "a copy of another segment"));
+    notes_.refuse(folder_.refusal(entry.name, "a copy of another segment"));
     return Done{};
   }
   if (mustWait(name)) {
@@ -285,7 +275,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     if (isWriterGone) {
       folded_.push_back({name, std::move(segment), {}, true});
     } else {
-      refuse(folder_.refusal(segment.entry.name, "a copy of another segment"));
+      notes_.refuse(folder_.refusal(segment.entry.name, "a copy of another segment"));
     }
     return Done{};
   }
@@ -368,21 +358,21 @@ void FoldRun::finishSegments() {
   report_.removed += counts_.removed;
   report_.dropped += counts_.dropped;
   report_.refused += counts_.refused;
-  report_.segmentsRefused += counts_.segmentsRefused;
+  report_.segmentsRefused += notes_.uncountedFiles();
+  notes_.clearUncountedFiles();
   counts_ = {};
 }
 
 Status foldAll(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes,
                const Recorders& recorders, FoldReport& report, std::int64_t storeBytes,
                const SegmentFolder::Listing& listing) {
-  FoldRun fold(folder, store, notes, recorders, report, storeBytes, 0);
+  FoldRun fold(folder, store, notes, recorders, report, storeBytes);
   Status done = fold.run(listing);
   if (!fold.hasReplacedStore()) return done;
   // The new store has no positions, and the values of earlier transactions are lost with the old
   // one.
   report.waiting = 0;
-  return FoldRun(folder, store, notes, recorders, report, storeBytes, fold.refusedSegments())
-      .run(listing);
+  return FoldRun(folder, store, notes, recorders, report, storeBytes).run(listing);
 }
 
 }  // namespace
