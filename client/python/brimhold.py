@@ -25,6 +25,7 @@ from __future__ import annotations
 import ctypes
 import enum
 import functools
+import math
 import operator
 import os
 import typing
@@ -97,7 +98,7 @@ def _key(key: str) -> bytes:
 def _integer(number: typing.SupportsIndex) -> int:
     value = operator.index(number)
     if not -(2**63) <= value < 2**63:
-        raise OverflowError(f"beyond 64 bits: {value}")
+        raise OverflowError("a number beyond 64 bits")
     return value
 
 
@@ -130,7 +131,12 @@ class Distribution:
 
     def record(self, value: float) -> None:
         """Appends a measurement."""
-        _library.BHClientDistributionRecord(self._handle, value)
+        try:
+            _library.BHClientDistributionRecord(self._handle, value)
+            return
+        except ctypes.ArgumentError:
+            pass
+        math.ldexp(value, 0)  # raises the TypeError or OverflowError that ctypes hid
 
     def timer(self, *, milliseconds: bool = False) -> Timer:
         """A timer that records into this distribution."""
@@ -146,6 +152,9 @@ class Timer:
 
         @distribution.timer()
         def work(): ...
+
+    A timer measures one block at a time: make one for each block. It measures any number of calls
+    of a function, or of a coroutine until it returns, but no generator.
     """
 
     __slots__ = ("_distribution", "_milliseconds", "_started")
@@ -156,6 +165,8 @@ class Timer:
         self._started: typing.Any = None
 
     def __enter__(self) -> Timer:
+        if self._started is not None:
+            raise RuntimeError("a timer measures one block at a time: make one for each block")
         self._started = _library.BHClientTimerStart()
         return self
 
@@ -170,12 +181,26 @@ class Timer:
             if self._milliseconds
             else _library.BHClientTimerStopSeconds
         )
-        stop(self._started, self._distribution._handle)
+        started, self._started = self._started, None
+        stop(started, self._distribution._handle)
 
     def __call__(self, function: typing.Callable[..., typing.Any]) -> typing.Callable[..., typing.Any]:
+        import inspect  # only here, since it takes milliseconds
+
+        if inspect.isgeneratorfunction(function) or inspect.isasyncgenfunction(function):
+            raise TypeError("a timer measures no generator: use it in a with statement")
+
+        def timer() -> Timer:
+            return Timer(self._distribution, milliseconds=self._milliseconds)
+
+        @functools.wraps(function)
+        async def timed_coroutine(*arguments: typing.Any, **named: typing.Any) -> typing.Any:
+            with timer():
+                return await function(*arguments, **named)
+
         @functools.wraps(function)
         def timed(*arguments: typing.Any, **named: typing.Any) -> typing.Any:
-            with Timer(self._distribution, milliseconds=self._milliseconds):
+            with timer():
                 return function(*arguments, **named)
 
-        return timed
+        return timed_coroutine if inspect.iscoroutinefunction(function) else timed

@@ -136,7 +136,7 @@ TEST_F(Programs, AForkedChildThatExecutesRecordsForItself) {
 
 TEST_F(Programs, PythonRecords) {
   const std::string program = R"(
-import brimhold, os
+import asyncio, brimhold, inspect, os
 count, gauge = brimhold.Scalar('py.count'), brimhold.Scalar('py.gauge')
 series, timed = brimhold.Distribution('py.series'), brimhold.Distribution('py.timed')
 count.add(); count.add(True); gauge.set(-2**63); series.record(1)
@@ -146,7 +146,17 @@ def double(x): return 2 * x
 try:
     with timed.timer(): raise KeyError
 except KeyError: print(double(4), double.__name__)
+@timed.timer()
+async def later(): return 9
+print(inspect.iscoroutinefunction(later), asyncio.run(later()))
+one = timed.timer()
+def nest():
+    with one, one: pass
+def numbers(): yield 1
+async def signals(): yield 1
 for wrong in (lambda: count.add(2**63), lambda: count.add(1.5), lambda: series.record('x'),
+              lambda: count.add(10**5000), lambda: series.record(10**400),
+              nest, lambda: one(numbers), lambda: one(signals),
               lambda: brimhold.Scalar(''), lambda: brimhold.Scalar('a\n'),
               lambda: brimhold.Distribution('ü' * 513)):
     try: wrong()
@@ -156,15 +166,15 @@ if os.fork() == 0: count.add(40)
 else: os.wait()
 )";
   setenv("PROGRAM", program.c_str(), 1);
-  EXPECT_EQ(
-      outputOf(kPython + "PYTHONPATH=" TAVREL_SOURCE "/client/python "
-                         "BRIMHOLD_LIBRARY=" TAVREL_BUILD "/client/libbrimhold.so.1 "
-                         "python3 -B -c \"$PROGRAM\""),
-      "8 double\nOverflowError\nTypeError\nArgumentError\nValueError\nValueError\nValueError\n"
-      "(<Status.RECORDING: 0>, 'values are recorded')\n");
+  EXPECT_EQ(outputOf(kPython + "PYTHONPATH=" TAVREL_SOURCE "/client/python "
+                               "BRIMHOLD_LIBRARY=" TAVREL_BUILD "/client/libbrimhold.so.1 "
+                               "python3 -B -c \"$PROGRAM\""),
+            "8 double\nTrue 9\nOverflowError\nTypeError\nTypeError\nOverflowError\nOverflowError\n"
+            "RuntimeError\nTypeError\nTypeError\nValueError\nValueError\nValueError\n"
+            "(<Status.RECORDING: 0>, 'values are recorded')\n");
   EXPECT_EQ(foldedScalars(), "py.count=42 py.gauge=-9223372036854775808 ");
   EXPECT_EQ(records["py.series"], std::vector<double>{1});
-  EXPECT_EQ(records["py.timed"].size(), 3U);
+  EXPECT_EQ(records["py.timed"].size(), 5U);
 }
 
 }  // namespace
