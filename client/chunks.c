@@ -47,8 +47,9 @@ static struct Chunk* takeReusable(struct State* state, struct Segment* segment) 
     uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
     if (!isReusable(chunk) || generation % 2 != 0) continue;
     if (!atomic_compare_exchange_strong(&chunk->generation, &generation, generation + 1)) continue;
-    /* Nobody writes records here now: every record of the generation is marked, and late
-     * reservations lie beyond the end. The count that lets writers in again is reset last. */
+    /* Nobody writes records here now: those of the generation are marked, and late reservations lie
+     * beyond the end, as only closed chunks are acknowledged. The count that lets writers in again
+     * is reset last. */
     for (uint32_t i = 0; i < kBHChunkRecords; ++i)
       atomic_store_explicit(&chunk->records[i].mark, 0, memory_order_relaxed);
     atomic_store_explicit(&chunk->generation, generation + 2, memory_order_release);
@@ -102,10 +103,13 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
 }
 
 /* Keeps an empty chunk that was taken in vain for a lane. One becomes the spare chunk; an earlier
- * spare has nothing to fold, so it is acknowledged as if it had been folded. */
+ * spare has nothing to fold, so it is acknowledged as if it had been folded. First it is closed,
+ * as a full one is: a thread that found it in a lane, before it was folded and emptied, may be
+ * about to record there. A chunk that has such a record stays as it is. */
 static void keepEmpty(struct State* state, struct Chunk* chunk) {
   chunk = atomic_exchange(&state->spareChunk, chunk);
-  if (!chunk) return;
+  uint64_t none = 0;
+  if (!chunk || !atomic_compare_exchange_strong(&chunk->reserved, &none, kBHChunkRecords)) return;
   const uint32_t generation = atomic_load_explicit(&chunk->generation, memory_order_relaxed);
   atomic_store_explicit(&chunk->acknowledged, generation, memory_order_release);
   atomic_fetch_add_explicit(&state->reusableChunks, 1, memory_order_relaxed);

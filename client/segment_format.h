@@ -105,7 +105,7 @@ enum {
   kBHCellAcknowledged = 56, /* u32, written by the reader */
 
   /* Chunk. */
-  kBHChunkReserved = 0,      /* u64 records begun, may exceed kBHChunkRecords */
+  kBHChunkReserved = 0,      /* u64 records begun; at least kBHChunkRecords once closed */
   kBHChunkGeneration = 8,    /* u32 */
   kBHChunkAcknowledged = 12, /* u32, written by the reader */
   kBHChunkFirst = 16,        /* records: f64 value, u64 mark */

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <barrier>
 #include <csignal>
+#include <cstring>
 #include <dlfcn.h>
 #include <random>
 #include <sched.h>
@@ -316,6 +317,35 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   fold();
   EXPECT_EQ(dropped, 8U);
   expectEachOnce(records["series"], records["series"].size(), 0);
+}
+
+TEST_F(Recording, AThreadMayStillRecordIntoAChunkThatIsEmptyAgain) {
+  constexpr int kCount = 4 * kBHChunkRecords;
+  run([&] {
+    int recorded = 0;
+    int handlers = 2;
+    // As in nested signal handlers, so that two chunks are taken in vain.
+    whileFetching = [&] {
+      if (recorded < kBHChunkRecords || handlers == 0) return;
+      const bool isFirst = handlers-- == 2;
+      record(recorded++);
+      if (!isFirst) return;
+      // What a thread does that had paused between two lines of bhPut. The spare is chunk 2.
+      const Descriptor file(open(segments().at(0).c_str(), O_RDWR | O_CLOEXEC));
+      const auto value = static_cast<double>(recorded++);
+      std::uint64_t words[2];
+      EXPECT_EQ(pread(file.get(), words, 16, kBHChunks + kBHChunkFirst), 16);
+      std::memcpy(words, &value, sizeof value);
+      constexpr std::uint64_t kSpare = kBHChunks + 2 * kBHChunkBytes;
+      EXPECT_EQ(pwrite(file.get(), words, 16, kSpare + kBHChunkFirst), 16);
+      words[0] = 1;
+      EXPECT_EQ(pwrite(file.get(), words, 8, kSpare + kBHChunkReserved), 8);
+    };
+    while (recorded < kCount)
+      record(recorded++);
+  });
+  fold();
+  expectEachOnce(records["series"], kCount, 0);
 }
 
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {
