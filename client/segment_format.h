@@ -54,7 +54,8 @@
  * the lease at once.) A process never opens an existing segment. A child made by fork unmaps the
  * segment at once; one made by another call does so at its first value or at exec. Where leases do
  * not work, the header names the process: PID namespace, PID and start time as in /proc/PID/stat;
- * it is gone when the reader is in the same namespace and no such process exists.
+ * it is gone when the reader is in the same namespace and no such process exists. (Processes that
+ * /proc hides may still exist.)
  */
 #ifndef BRIMHOLD_SEGMENT_FORMAT_H
 #define BRIMHOLD_SEGMENT_FORMAT_H

@@ -5,6 +5,7 @@
 #include <csignal>
 #include <cstring>
 #include <dlfcn.h>
+#include <grp.h>
 #include <random>
 #include <sched.h>
 #include <sys/mount.h>
@@ -522,6 +523,16 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
   EXPECT_EQ(facts.pid, static_cast<std::uint32_t>(child));
   EXPECT_EQ(writerOf(segment), SegmentWriter::Present);
   EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Present);
+  run([&] {  // as another user, from whom /proc hides the process; if root may mount
+    if (unshare(CLONE_NEWNS) != 0 ||
+        mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
+        mount("proc", "/proc", "proc", 0, "hidepid=2") != 0 || setgroups(0, nullptr) != 0 ||
+        setgid(12) != 0 || setuid(12) != 0) {
+      return;
+    }
+    EXPECT_EQ(access(("/proc/" + std::to_string(child)).c_str(), F_OK), -1);
+    EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Unknown);
+  });
   kill(child, SIGKILL);
   waitFor(child);
   EXPECT_EQ(writerOf(segment), SegmentWriter::Gone);

@@ -6,6 +6,7 @@
 #include <string>
 #include <sys/stat.h>
 #include <unistd.h>
+#include <utility>
 
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/process_stat.h"
@@ -28,6 +29,11 @@ Lookup startOf(std::uint32_t pid, std::uint64_t& start) {
   return Lookup::Found;
 }
 
+// The mount option hidepid= keeps processes of other users out of /proc.
+bool exists(std::uint32_t pid) {
+  return std::in_range<pid_t>(pid) && (kill(static_cast<pid_t>(pid), 0) == 0 || errno != ESRCH);
+}
+
 }  // namespace
 
 SegmentWriter findSegmentProcess(const SegmentFacts& facts) {
@@ -41,7 +47,8 @@ SegmentWriter findSegmentProcess(const SegmentFacts& facts) {
     case Lookup::Found:
       return start == facts.processStart ? SegmentWriter::Present : SegmentWriter::Gone;
     case Lookup::Absent:
-      return SegmentWriter::Gone;
+      if (!exists(facts.pid)) return SegmentWriter::Gone;
+      break;
     case Lookup::Failed:
       break;
   }
