@@ -25,6 +25,13 @@ bool parseFinite(std::string_view text, double& number) {
   return true;
 }
 
+// Whether a value of the line can be added to a scalar, or set.
+bool isInRange(const StatsdLine& line, double value) {
+  if (line.kind == StatsdKind::Series) return true;
+  if (line.kind == StatsdKind::Counter) value /= line.rate;
+  return value >= -0x1p63 && value < 0x1p63;
+}
+
 bool parseRate(std::string_view text, double& rate) {
   return parseFinite(text, rate) && rate > 0 && rate <= 1;
 }
@@ -72,7 +79,8 @@ StatsdParse parseStatsdLine(std::string_view text, StatsdLine& result) {
   result.values.clear();
   do {
     double value = 0;
-    if (!parseFinite(takeUntil(values, ':'), value)) return StatsdParse::Malformed;
+    if (!parseFinite(takeUntil(values, ':'), value) || !isInRange(result, value))
+      return StatsdParse::Malformed;
     result.values.push_back(value);
   } while (!values.empty());
   const bool isGauge = result.kind == StatsdKind::Gauge || result.kind == StatsdKind::GaugeDelta;

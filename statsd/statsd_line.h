@@ -27,7 +27,8 @@ struct StatsdLine {
   /// Not empty, and without tags. Points into the parsed line.
   std::string_view name;
   StatsdKind kind;
-  /// One or more, all finite. Gauges have one.
+  /// One or more, all finite; those of scalars fit 64 bits, also divided by the rate. Gauges have
+  /// one.
   std::vector<double> values;
   /// The fraction of all events that the client sent, above 0 and at most 1.
   double rate;
