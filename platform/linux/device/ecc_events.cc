@@ -77,14 +77,7 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
   if (buffer.size() < kEccEventBytes) return {ENOMEM, 0};
   if (!unfiled_.empty() || handedOut_ == kEccEventsOfARun) return endRun(EBUSY);
   if (queue_.empty()) fill();
-  if (mode_ == Mode::Consume && !queue_.empty() && !folderLock_) {
-    auto lock = files_.lockFolder(root_.path(kFolder));
-    if (!lock) {
-      log_.write(LogLevel::Error, lock.error().message);
-      return endRun(EBUSY);
-    }
-    folderLock_ = *std::move(lock);
-  }
+  if (mode_ == Mode::Consume && !queue_.empty() && !lockQueue()) return endRun(EBUSY);
   while (!queue_.empty()) {
     const Event event = std::move(queue_.back());
     queue_.pop_back();
@@ -140,6 +133,17 @@ void EccEvents::setAside(const std::string& path, std::string_view fault) {
   log_.log(LogLevel::Error, "%s: %s; %s", path, fault, outcome);
 }
 
+bool EccEvents::lockQueue() {
+  if (folderLock_) return true;
+  auto lock = files_.lockFolder(root_.path(kFolder));
+  if (!lock) {
+    log_.write(LogLevel::Error, lock.error().message);
+    return false;
+  }
+  folderLock_ = *std::move(lock);
+  return true;
+}
+
 void EccEvents::fill() {
   const bool isPeek = mode_ == Mode::Peek;
   if (std::exchange(hasLooked_, true) && isPeek) return;
@@ -171,18 +175,35 @@ void EccEvents::publishCountedErrors() {
   const plist::Value before = mutableCopy(counted);
   const std::vector<Event> events = newErrors(counted);
   if (before == plist::Value(counted)) return;
+  if (!folderLock_) {
+    // Another process may publish the same errors until the folder is locked.
+    if (Status made = files_.makeFolders(root_.path(kFolder)); !made) {
+      return log_.write(LogLevel::Error, made.error().message);
+    }
+    if (lockQueue()) publishCountedErrors();
+    return;
+  }
+  const Status published = publish(events, counted);
+  if (published) return;
+  log_.write(LogLevel::Error, published.error().message);
+  // Without stored counts, the next look would publish these errors again. The counts may be in
+  // place although they could not be flushed.
+  if (before != plist::Value(seenErrors())) return;
+  for (const Event& event : events)
+    files_.discard(root_.path(kFolder) + '/' + event.name);
+}
 
-  // Events first: a run that is cut off here publishes them twice instead of never.
+// Events first: a run that is cut off in between publishes them twice instead of never.
+Status EccEvents::publish(const std::vector<Event>& events, const plist::Dictionary& counted) {
   for (const Event& event : events) {
     const std::string path = root_.path(kFolder) + '/' + event.name;
     if (Status written = files_.replace(path, asBytes(event.bytes), kMode); !written) {
-      return log_.write(LogLevel::Error, written.error().message);
+      return written;
     }
   }
   const auto bytes = propertyLists_.encodeXml(counted);
-  const Status written =
-      bytes ? files_.replace(root_.path(kCounters), asBytes(*bytes), kMode) : Status(bytes.error());
-  if (!written) log_.write(LogLevel::Error, written.error().message);
+  if (!bytes) return bytes.error();
+  return files_.replace(root_.path(kCounters), asBytes(*bytes), kMode);
 }
 
 std::vector<EccEvents::Event> EccEvents::newErrors(plist::Dictionary& counted) {

@@ -9,7 +9,8 @@
 // An event is removed once `filed` says that its record is safe, an error as soon as it is read. A
 // run of reads ends with the first that fails. It gives ten events at most, and none after an event
 // that was not filed: the next read fails with EBUSY and removes nothing. The folder is locked from
-// a run's first event to its end, so that no other process hands out the same ones.
+// a run's first event to its end, and while events are published, so that no other process hands
+// out or publishes the same ones.
 //
 // New errors that the kernel has counted (EDAC) since the last look are published into the queue:
 // identifier 1 for corrected and 2 for uncorrected errors, with three registers: the number of the
@@ -62,13 +63,17 @@ class EccEvents {
   };
 
   SystemControls::Result endRun(int errorNumber);
+  /// Locks the folder for the rest of the run; false, and a line, when that fails.
+  bool lockQueue();
   void fill();
   /// Renames an unusable file out of the way; when peeking, only logs that it would.
   void setAside(const std::string& path, std::string_view fault);
   /// The counts at the last look; for a controller that is gone, the last known ones.
   plist::Dictionary seenErrors();
-  /// Writes events for the errors counted since the last look, and remembers the counts.
+  /// Writes events for the errors counted since the last look, and remembers the counts. Writes no
+  /// event when the counts cannot be stored.
   void publishCountedErrors();
+  Status publish(const std::vector<Event>& events, const plist::Dictionary& counted);
   /// The events for errors beyond `counted`, which is updated.
   std::vector<Event> newErrors(plist::Dictionary& counted);
   /// The ID of the boot in which the controllers in that folder have counted. A root that has
