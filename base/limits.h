@@ -156,6 +156,10 @@ inline constexpr std::size_t kDesktopEntries = 100'000;
 /// Files and folders examined for desktop entries: users may put anything into their folders.
 inline constexpr std::size_t kDesktopFiles = 1'000'000;
 
+/// Folders in each other, below `applications`, that are searched for desktop entries. Each one
+/// takes a descriptor.
+inline constexpr int kDesktopFolderDepth = 16;
+
 /// Bytes of a desktop entry: a few lines of text in many languages.
 inline constexpr std::uint64_t kDesktopEntryBytes = 1U << 20;
 

@@ -1,7 +1,10 @@
 
+#include <sys/inotify.h>
+
 #include "device_services.h"
 #include "platform/application_registry.h"
 #include "platform/linux/device/linux_applications.h"
+#include "platform/linux/files/descriptor.h"
 
 namespace tavrel {
 namespace {
@@ -66,12 +69,22 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   writeEntry("/usr/share/applications/huge.desktop",
              "Type=Application\nX=" + std::string(limits::kDesktopEntryBytes, 'x'));
   writeEntry("/elsewhere/share/applications/foreign.desktop", "Type=Application");
+  std::string path = "/usr/share/applications";
+  std::string prefix;
+  for (int depth = 0; depth < limits::kDesktopFolderDepth; ++depth) {
+    path += "/d";
+    prefix += "d-";
+  }
+  writeEntry(path + "/deep.desktop", "Type=Application");
+  writeEntry(path + "/d/deeper.desktop", "Type=Application");
   std::filesystem::create_directory(root.path("/home/eve"));
   std::filesystem::create_directory_symlink(root.path("/elsewhere"), root.path("/home/eve/.local"));
   auto found = bundles();
   std::sort(found.begin(), found.end());
-  EXPECT_EQ(found, (Lines{"editor.desktop System", "kde-mail.desktop User", "tool.desktop User"}));
-  EXPECT_EQ(log.lines, Lines{});
+  EXPECT_EQ(found, (Lines{prefix + "deep.desktop System", "editor.desktop System",
+                          "kde-mail.desktop User", "tool.desktop User"}));
+  EXPECT_EQ(log.lines, Lines{"desktop entries below more than 16 folders do not count, as in " +
+                             root.path(path + "/d")});
 }
 
 TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
@@ -80,8 +93,12 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   write("/var/lib/dpkg/status", "Package: a\nStatus: install ok installed\nArchitecture: all\n");
   write("/var/lib/apt/placeholder", "");
   const std::string states = root.path("/var/lib/apt/extended_states");
-  ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);  // reading it would wait for a writer for ever
+  ASSERT_EQ(mkfifo(states.c_str(), 0600), 0);
+  const Descriptor watch(inotify_init1(IN_NONBLOCK));
+  ASSERT_NE(inotify_add_watch(watch.get(), states.c_str(), IN_OPEN), -1);
   EXPECT_EQ(bundles(), Lines{"a:all User"});
+  inotify_event opened;
+  EXPECT_EQ(read(watch.get(), &opened, sizeof(opened)), -1) << "opening a device may have effects";
   EXPECT_EQ(log.lines, Lines{"cannot read " + states +
                              ": Invalid argument; packages that were installed "
                              "automatically count as installed by the user"});

@@ -7,6 +7,7 @@
 #include <string_view>
 #include <sys/stat.h>
 #include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "base/keyed_hash.h"
@@ -87,7 +88,8 @@ class Enumeration {
   bool isFull() const { return isFull_; }
 
   /// The error number of what ended it early, except for folders that may not be read.
-  int visit(const std::string& folder, const std::string& prefix, std::string_view bundleType) {
+  int visit(const std::string& folder, const std::string& prefix, std::string_view bundleType,
+            int depth = 0) {
     int inner = 0;
     const int code = walkFolder(folder, [&](const dirent& entry) {
       const std::string path = folder + '/' + entry.d_name;
@@ -100,8 +102,8 @@ class Enumeration {
       } else if (path.ends_with(".desktop")) {
         take(path, prefix + entry.d_name, bundleType);
       }
-      if (!isFull_ && isFolder(path, entry)) {
-        inner = visit(path, prefix + entry.d_name + '-', bundleType);
+      if (!isFull_ && isFolder(path, entry) && !isTooDeep(path, depth)) {
+        inner = visit(path, prefix + entry.d_name + '-', bundleType, depth + 1);
       }
       return !isFull_ && inner == 0;
     });
@@ -110,6 +112,15 @@ class Enumeration {
   }
 
  private:
+  bool isTooDeep(const std::string& path, int depth) {
+    if (depth < limits::kDesktopFolderDepth) return false;
+    if (!std::exchange(isDepthTold_, true)) {
+      log_.log(LogLevel::Error, "desktop entries below more than %d folders do not count, as in %s",
+               limits::kDesktopFolderDepth, path);
+    }
+    return true;
+  }
+
   void take(const std::string& path, std::string identifier, std::string_view bundleType) {
     if (seen_.contains(identifier)) return;
     if (seen_.size() == limits::kDesktopEntries) {
@@ -127,6 +138,7 @@ class Enumeration {
   std::unordered_set<std::string, KeyedHash> seen_;
   std::size_t visited_ = 0;
   bool isFull_ = false;
+  bool isDepthTold_ = false;
 };
 
 }  // namespace

@@ -11,6 +11,17 @@
 #include "base/limits.h"
 
 namespace tavrel {
+namespace {
+
+/// For reading. Without /proc it fails with ENOTSUP.
+Descriptor reopen(const Descriptor& found) {
+  const std::string path = "/proc/self/fd/" + std::to_string(found.get());
+  Descriptor descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  if (!descriptor && errno == ENOENT) errno = ENOTSUP;
+  return descriptor;
+}
+
+}  // namespace
 
 std::string_view trimmed(std::string_view text) {
   constexpr std::string_view kBlank = " \t\r";
@@ -20,15 +31,18 @@ std::string_view trimmed(std::string_view text) {
 }
 
 LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
-  // Opening a pipe without a writer would otherwise wait for one.
-  descriptor_ = Descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
+  // The path may be a user's link to a device, and opening some devices has an effect: a watchdog
+  // starts. So look first, and open only what was found.
+  const Descriptor found(open(path.c_str(), O_PATH | O_CLOEXEC));
   struct stat status {};
-  if (!descriptor_ || fstat(descriptor_.get(), &status) != 0) {
+  if (!found || fstat(found.get(), &status) != 0) {
     errorNumber_ = errno;
   } else if (!S_ISREG(status.st_mode)) {
     errorNumber_ = EINVAL;
   } else if (static_cast<std::uint64_t>(status.st_size) > largest) {
     errorNumber_ = EFBIG;
+  } else if (descriptor_ = reopen(found); !descriptor_) {
+    errorNumber_ = errno;
   } else {
     buffer_ = std::make_unique_for_overwrite<char[]>(limits::kTextLineBytes);
   }

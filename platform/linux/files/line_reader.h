@@ -21,7 +21,7 @@ std::string_view trimmed(std::string_view text);
 
 class LineReader {
  public:
-  /// Only regular files are read; a folder, a pipe or a device fails with EINVAL, a file of more
+  /// Only regular files are opened; a folder, a pipe or a device fails with EINVAL, a file of more
   /// than `largest` bytes with EFBIG.
   explicit LineReader(const std::string& path, std::uint64_t largest = UINT64_MAX);
 
