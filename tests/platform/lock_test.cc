@@ -11,6 +11,7 @@
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/logs/file_crash_reporting.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/platform.h"
 
@@ -22,6 +23,7 @@ const std::string kSubmission = "/var/mobile/Library/Logs/Submission";
 const std::string kStoreFolder = "/var/mobile/Library/Brimhold";
 const std::string kSegments = "/run/tavrel/stat";
 const std::string kEvents = "/var/lib/tavrel/ecc-events";
+const std::string kRecords = "/var/mobile/Library/Logs/CrashReporter/StructuredData";
 
 struct LockTest : testing::Test, DeviceServices {};
 
@@ -66,8 +68,11 @@ TEST_F(LockTest, AnotherUserHindersNoProgram) {
     write(kEvents + "/" + std::to_string(i) + ".event", std::string(kEccEventBytes, 'e'));
   for (const std::string& folder : {kSegments, kSubmission, kStoreFolder})
     fs::create_directories(root.path(folder));
+  const std::string records = kRecords + "/176-2026-11-27.jsonl";
+  write(records, "");  // a group may be allowed to read it
   const Hinderer hinderer({root.path("/"), root.path("/run/tavrel"), root.path(kSegments),
-                           root.path(kSubmission), root.path(kStoreFolder), events});
+                           root.path(kSubmission), root.path(kStoreFolder), events,
+                           root.path(kRecords), root.path(records)});
 
   LinuxPlatform device(root, {.log = &log});
   Platform& platform = device.platform();
@@ -93,9 +98,15 @@ TEST_F(LockTest, AnotherUserHindersNoProgram) {
   EccEvents queue(root, files, coding, log, EccEvents::Mode::Consume);
   EXPECT_EQ(queue.next(buffer).errorNumber, 0);
   queue.filed();
+  LinuxSystemVersion version(root, files, coding, log);
+  FileCrashReporting(root, files, version, queue, clock, log).FLLogStructuredData(176, {{"k", 1}});
+  EXPECT_EQ(contentOf(root.path(records)),
+            R"({"time":"2026-11-27T18:02:18.250Z","type":176,"record":{"k":1}})"
+            "\n");
   EXPECT_EQ(count(events), 16) << "two were beyond the limit, one was read; one is the lock's";
   EXPECT_EQ(log.lines, Lines{});
-  for (const std::string& folder : {std::string("/run/tavrel"), kSubmission, kStoreFolder, kEvents})
+  for (const std::string& folder :
+       {std::string("/run/tavrel"), kSubmission, kStoreFolder, kEvents, kRecords})
     EXPECT_EQ(FileSystem::status(root.path(folder + "/.lock"))->st_mode, S_IFREG | 0600) << folder;
 }
 

@@ -227,7 +227,6 @@ Expected<Descriptor> FileSystem::openOrMake(const std::string& path, int flags, 
 Expected<AppendedFile> FileSystem::openToAppend(const std::string& path, mode_t mode) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR | O_APPEND, mode);
   if (!descriptor) return descriptor.error();
-  if (Status locked = lock(descriptor->get(), path); !locked) return locked.error();
   struct stat status {};
   if (fstat(descriptor->get(), &status) != 0) return systemError("write", path);
   if (!S_ISREG(status.st_mode)) return notRegular(path, status.st_mode);
@@ -298,10 +297,12 @@ Expected<Descriptor> FileSystem::openFolderLock(const std::string& folder) {
   return open;
 }
 
-Expected<Descriptor> FileSystem::lockFolder(const std::string& folder) {
+Expected<Descriptor> FileSystem::lockFolder(const std::string& folder,
+                                            const LockPatience& patience) {
   Expected<Descriptor> descriptor = openFolderLock(folder);
   if (!descriptor) return descriptor;
-  if (Status locked = lock(descriptor->get(), folder + kLockName); !locked) return locked.error();
+  const Status locked = lock(descriptor->get(), folder + kLockName, patience);
+  if (!locked) return locked.error();
   return descriptor;
 }
 

@@ -71,8 +71,7 @@ struct LockPatience {
   std::string_view advice = "end that process";
 };
 
-/// A file that grows by whole lines. It is locked until the handle is released: others that append
-/// through this class wait, readers do not.
+/// A file that grows by whole lines.
 class AppendedFile {
  public:
   /// Appends lines in one write, which survives the end of the process but not a power cut. Lines
@@ -115,12 +114,13 @@ class FileSystem {
   /// process left in the folder are removed once they are older than
   /// `limits::kTemporaryFileSeconds`.
   Expected<NewFile> create(const std::string& path, mode_t mode);
-  /// An existing file keeps its owner and its mode, except for permissions that `mode` withholds.
+  /// An existing file keeps its owner and its mode, minus permissions of other users that `mode`
+  /// does not grant. The group's permissions stay.
   Status replace(const std::string& path, ByteSpan bytes, mode_t mode);
 
   /// Opens a file, but no symbolic link, to append to it; creates it and its folder when missing.
   /// Cuts off what a kill or a power cut left after the last whole line: a line without an end,
-  /// lines of zero bytes. Waits for another process at most `limits::kFileLockMilliseconds`.
+  /// lines of zero bytes. The caller keeps other writers out.
   Expected<AppendedFile> openToAppend(const std::string& path, mode_t mode);
 
   /// Moves a file, over an existing one, and makes that durable.
@@ -144,7 +144,7 @@ class FileSystem {
   /// file must belong to a trusted user.
   Expected<Descriptor> lockFile(const std::string& path, const LockPatience& patience = {});
   /// The same with the file `.lock` of a folder, which must exist.
-  Expected<Descriptor> lockFolder(const std::string& folder);
+  Expected<Descriptor> lockFolder(const std::string& folder, const LockPatience& patience = {});
   /// Opens that file without locking it.
   Expected<Descriptor> openFolderLock(const std::string& folder);
 
@@ -169,7 +169,7 @@ class FileSystem {
   friend class NewFile;
   Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
   Expected<Descriptor> keepFromOthers(Descriptor lock, const std::string& path);
-  Status lock(int descriptor, const std::string& path, const LockPatience& patience = {});
+  Status lock(int descriptor, const std::string& path, const LockPatience& patience);
   Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
   Status syncFolderOf(const std::string& path);
   void removeStaleTemporaries(const std::string& folder, const struct stat& fresh);

@@ -58,7 +58,17 @@ void FileCrashReporting::refuse(std::uint32_t type, const Error& error) {
            type == kEccRecordType ? "wait for the next run" : "are dropped", error.message);
 }
 
-// A file that cannot be opened is not tried again for each record: each try may wait for its lock.
+Status FileCrashReporting::lockRecords() {
+  if (lock_) return Done{};
+  const std::string folder = root_.path(kRecordFolder);
+  if (Status made = files_.makeFolders(folder); !made) return made;
+  auto lock = files_.lockFolder(folder);
+  if (!lock) return lock.error();
+  lock_ = *std::move(lock);
+  return Done{};
+}
+
+// A file that cannot be opened is not tried again for each record: each try may wait for the lock.
 FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t type,
                                                                std::int64_t day) {
   const auto known = recordFiles_.find(type);
@@ -69,7 +79,8 @@ FileCrashReporting::RecordFile& FileCrashReporting::recordFile(std::uint32_t typ
   std::string path = root_.path(kRecordFolder);
   path += '/';
   path += recordFileName({type, day});
-  auto file = files_.openToAppend(path, kRecordMode);
+  const Status locked = lockRecords();
+  auto file = locked ? files_.openToAppend(path, kRecordMode) : locked.error();
   if (file) {
     records.file = *std::move(file);
   } else {
@@ -125,6 +136,7 @@ void FileCrashReporting::flushRecords() {
   for (auto& [type, records] : recordFiles_)
     flush(records);
   recordFiles_.clear();
+  lock_.reset();
 }
 
 bool FileCrashReporting::hasSupportLog() {

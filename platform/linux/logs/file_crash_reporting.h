@@ -69,6 +69,8 @@ class FileCrashReporting final : public CrashReporting {
   };
 
   void refuse(std::uint32_t type, const Error& error);
+  /// Keeps other processes from writing records until `flushRecords`.
+  Status lockRecords();
   RecordFile& recordFile(std::uint32_t type, std::int64_t day);
   void flush(RecordFile& file);
   void flushRecords();
@@ -81,6 +83,7 @@ class FileCrashReporting final : public CrashReporting {
   Clock& clock_;
   SystemLog& log_;
   std::map<std::uint32_t, RecordFile> recordFiles_;  // by type
+  Descriptor lock_;
 };
 
 }  // namespace tavrel
