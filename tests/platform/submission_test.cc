@@ -276,6 +276,20 @@ TEST(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
   ask();
   EXPECT_EQ(files(), before);
 
+  // Preferences that become unreadable after the first look may hold a permission, too.
+  permit(device, false);
+  struct Damaging : FileSystem {
+    explicit Damaging(const TemporaryRoot& device) : root(device) {}
+    int openFile(const char* path, int flags, mode_t mode) override {
+      if (std::string_view(path).ends_with("Submission/.lock")) root.write(kPermission, "damaged");
+      return FileSystem::openFile(path, flags, mode);
+    }
+    const TemporaryRoot& root;
+  } damaging(device);
+  EXPECT_FALSE(Service(device.root, damaging).submission.isDiagnosticSubmissionEnabled());
+  EXPECT_EQ(contentOf(device.root.path(kPermission)), "damaged");
+  EXPECT_EQ(files(), before);
+
   permit(device, false, kToday + 1);
   EXPECT_EQ(ask(),
             (std::vector<std::string>{"submission is not allowed: 3 waiting logs deleted",

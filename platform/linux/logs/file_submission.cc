@@ -357,7 +357,10 @@ RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
   if (!FileSystem::status(folder_)) return {};
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return {0, lock.error()};
-  if (onlyWithoutPermission && checkPermission()) return {};
+  if (onlyWithoutPermission) {
+    const auto stored = storedSubmissionPermission(services_.filePreferences);
+    if (!stored || stored->isGiven) return {};
+  }
   return removeLogsIn(files_, folders);
 }
 
