@@ -3,6 +3,7 @@
 #include <cstring>
 #include <numeric>
 #include <sqlite3.h>
+#include <sys/file.h>
 
 #include "device_services.h"
 #include "faulty_file_system.h"
@@ -99,7 +100,12 @@ TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
   EXPECT_EQ(tidy().failures,
             Lines{path + ": it is a link that leads nowhere: nothing is removed until "
                          "it is repaired"});
-  std::filesystem::remove(path);
+  std::filesystem::remove_all(root.path("/etc/tavrel"));
+  std::filesystem::create_symlink("nowhere", root.path("/etc/tavrel"));
+  EXPECT_EQ(tidy().failures,
+            Lines{path + ": its folder is a link that leads nowhere, or a file: nothing is removed "
+                         "until it is repaired"});
+  std::filesystem::remove(root.path("/etc/tavrel"));
   limit({{"Store", plist::Dictionary{{"Days", 36'500}}}});
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_FALSE(std::filesystem::exists(root.path(kTidyFailuresFile)));
@@ -306,6 +312,7 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   write("/var/lib/tavrel/ecc-events/b.event", std::string(60'000, 'e'));
   write("/var/lib/tavrel/ecc-events/a.event", std::string(60'000, 'e'));
   write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x", std::string(70'000, 'c'));
+  write("/var/mobile/Library/Preferences/com.example.corrupt-x.plist", std::string(70'000, 'p'));
   const plist::Dictionary small{{"Bytes", 65536}};
   limit({{"Pending", plist::Dictionary{{"Bytes", 100'000}}},
          {"Records", small},
@@ -335,6 +342,37 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   limit({{"Pending", small}});
   EXPECT_EQ(tidy().kinds[1].removed, 1);
   EXPECT_EQ(files.list(root.path(kPending))->size(), 3U);
+}
+
+TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {
+  struct Stuck : FileSystem {
+    explicit Stuck(const std::string& path) : lock(path) {}
+    int removeFile(const char* path) override {
+      const Descriptor other(open(lock.c_str(), O_RDONLY));
+      isLocked = isLocked && other && flock(other.get(), LOCK_EX | LOCK_NB) != 0;
+      const std::string log = path;
+      if (const auto day = log.find("20261125"); day != log.npos) {
+        fs::remove(std::string(log).replace(day, 8, "20261126"));  // the uploader has sent it
+      }
+      if (log.find("20261124") == log.npos) return FileSystem::removeFile(path);
+      errno = EPERM;
+      return -1;
+    }
+    std::string lock;
+    bool isLocked = true;
+  } stuck(root.path("/var/mobile/Library/Logs/Submission/.lock"));
+  for (int day = 24; day <= 27; ++day)
+    write(format("%sS-202611%dT000000Z-00000000.log", kPending, day), "L");
+  limit({{"Pending", plist::Dictionary{{"Days", 2}}}});
+  const TidyReport report = Tidy(root, stuck, coding, clock, preferences, store).run();
+  EXPECT_EQ(report.failures,
+            Lines{"cannot remove " + root.path(kPending) +
+                  "S-20261124T000000Z-00000000.log: Operation not permitted" +
+                  (geteuid() == 0 ? "" : "; run as root or as the owner of the files")});
+  EXPECT_EQ(report.kinds[1].removed, 1);
+  EXPECT_EQ(*files.list(root.path(kPending)),
+            (Lines{"S-20261124T000000Z-00000000.log", "S-20261127T000000Z-00000000.log"}));
+  EXPECT_TRUE(stuck.isLocked);
 }
 
 TEST(LimitsFaults, LogsHaveTheirMetadataAfterEveryFault) {

@@ -1,6 +1,7 @@
 #include "platform/linux/files/system_error.h"
 
 #include <system_error>
+#include <unistd.h>
 
 namespace tavrel {
 namespace {
@@ -9,7 +10,7 @@ std::string_view adviceFor(int code) {
   switch (code) {
     case EACCES:
     case EPERM:
-      return "; run as root or as the owner of the files";
+      return geteuid() != 0 ? "; run as root or as the owner of the files" : "";
     case ENOSPC:
     case EDQUOT:
       return "; free some space";

@@ -68,6 +68,11 @@ Expected<DeviceLimits> DeviceLimits::read(const DeviceRoot& root, FileSystem& fi
   if (!bytes) return Error{bytes.error().message + ": nothing is removed"};
   if (!*bytes) {
     struct stat link {};
+    const std::string folder = path.substr(0, path.rfind('/'));
+    const auto found = FileSystem::status(folder);
+    if (lstat(folder.c_str(), &link) == 0 && !(found && S_ISDIR(found->st_mode))) {
+      return refuse("its folder is a link that leads nowhere, or a file");
+    }
     if (lstat(path.c_str(), &link) == 0) return refuse("it is a link that leads nowhere");
     return limits;
   }

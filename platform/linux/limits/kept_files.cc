@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <set>
+#include <utility>
 
 #include "base/civil_time.h"
 #include "base/limits.h"
@@ -12,7 +13,7 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kSubmissionFolder = "/var/mobile/Library/Logs/Submission/";
+constexpr std::string_view kSubmissionFolder = "/var/mobile/Library/Logs/Submission";
 constexpr std::string_view kEventFolder = "/var/lib/tavrel/ecc-events";
 constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold",
                                                  "/var/mobile/Library/Preferences", kEventFolder};
@@ -21,13 +22,13 @@ constexpr std::int64_t kBlockBytes = 4096;
 std::string_view folderOf(Kept kind) {
   switch (kind) {
     case Kept::Pending:
-      return "pending";
+      return "/pending";
     case Kept::Outbox:
-      return "outbox";
+      return "/outbox";
     case Kept::Withheld:
-      return "withheld";
+      return "/withheld";
     default:
-      return "refused";
+      return "/refused";
   }
 }
 
@@ -39,15 +40,22 @@ std::int64_t dayOfSecond(std::int64_t seconds) {
   return (seconds - secondOfDay(seconds)) / kSecondsPerDay;
 }
 
+// The names of preferences in use may contain ".corrupt-", too; those set aside end in a stamp.
 bool isSetAside(std::string_view name) {
-  return name.find(".corrupt-") != name.npos || name.ends_with("-kept-damaged") ||
-         name.ends_with(".unusable");
+  return (name.find(".corrupt-") != name.npos && !name.ends_with(".plist")) ||
+         name.ends_with("-kept-damaged") || name.ends_with(".unusable");
 }
 
 }  // namespace
 
 std::int64_t KeptFile::day() const {
   return dayOfSecond(seconds);
+}
+
+Expected<Descriptor> KeptFiles::lock(Kept kind, const DeviceRoot& root, FileSystem& files) {
+  if (kind == Kept::Records || kind == Kept::SetAside) return Descriptor();
+  const std::string folder = root.path(kind == Kept::EccEvents ? kEventFolder : kSubmissionFolder);
+  return FileSystem::status(folder) ? files.lockFolder(folder) : Descriptor();
 }
 
 Expected<KeptFiles> KeptFiles::list(Kept kind, const DeviceRoot& root, FileSystem& files,
@@ -169,41 +177,39 @@ bool KeptFiles::stays(std::size_t index) const {
 
 TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
   removeOrphans(now);
-  // Files of one day are adjacent, so a day has gone once the next file is of another day.
+  TrimmedFiles trimmed;
   KeptUse left = use();
-  std::size_t count = 0;
-  while (count < list_.size() && (left.days > bounds.days || left.bytes > bounds.bytes) &&
-         !stays(count)) {
-    const KeptFile& file = list_[count];
-    left.bytes -= file.bytes;
-    if (++count == list_.size() || list_[count].day() != file.day()) --left.days;
+  std::vector<std::string> companions;
+  bool dayStays = false;
+  for (std::size_t i = 0; i < list_.size() && !stays(i); ++i) {
+    if (left.days <= bounds.days && left.bytes <= bounds.bytes) break;
+    const KeptFile& file = list_[i];
+    // A log that the uploader has sent meanwhile is not lost.
+    const bool isThere = FileSystem::status(file.path).has_value();
+    if (Status removed = fileSystem_.remove(file.path); removed) {
+      trimmed.removed += isThere ? 1 : 0;
+      left.bytes -= file.bytes;
+      if (!file.companion.empty()) companions.push_back(file.companion);
+    } else {
+      dayStays = true;
+      if (trimmed.status) trimmed.status = removed;
+    }
+    // Files of one day are adjacent, so a day has gone once the next file is of another day.
+    const bool isLastOfDay = i + 1 == list_.size() || list_[i + 1].day() != file.day();
+    if (isLastOfDay && !std::exchange(dayStays, false)) --left.days;
   }
-  if (count == 0) return {};
-  // The same lock as for a run that hands out events.
-  Expected<Descriptor> lock = Descriptor();
-  if (kind_ == Kept::EccEvents) lock = fileSystem_.lockFolder(folder_);
-  if (!lock) return {0, lock.error()};
-  return removeFirst(count);
+  if (Status removed = removeCompanions(companions); trimmed.status) trimmed.status = removed;
+  return trimmed;
 }
 
 // Logs before their metadata: while a log exists, even after a power cut, its metadata does too.
-TrimmedFiles KeptFiles::removeFirst(std::size_t count) {
-  TrimmedFiles trimmed;
-  std::size_t gone = 0;
-  while (gone < count && trimmed.status) {
-    trimmed.status = fileSystem_.remove(list_[gone].path);
-    if (trimmed.status) ++gone;
-  }
-  trimmed.removed = static_cast<std::int64_t>(gone);
-  if (gone == 0 || list_.front().companion.empty()) return trimmed;
-  if (Status flushed = fileSystem_.flushFolder(folder_); !flushed) {
-    trimmed.status = flushed;
-    return trimmed;
-  }
-  // Metadata that cannot be removed now is removed as an orphan later.
-  for (std::size_t i = 0; i < gone; ++i)
-    fileSystem_.discard(list_[i].companion);
-  return trimmed;
+// Metadata that cannot be removed now is removed as an orphan later.
+Status KeptFiles::removeCompanions(const std::vector<std::string>& companions) {
+  if (companions.empty()) return Done{};
+  if (Status flushed = fileSystem_.flushFolder(folder_); !flushed) return flushed;
+  for (const std::string& companion : companions)
+    fileSystem_.discard(companion);
+  return Done{};
 }
 
 void KeptFiles::removeOrphans(std::int64_t now) {

@@ -41,7 +41,7 @@ struct KeptUse {
 
 struct TrimmedFiles {
   std::int64_t removed = 0;
-  Status status = Done{};  // why not everything was removed
+  Status status = Done{};  // the first failure
 };
 
 class KeptFiles {
@@ -50,9 +50,14 @@ class KeptFiles {
   static Expected<KeptFiles> list(Kept kind, const DeviceRoot& root, FileSystem& files,
                                   std::int64_t today);
 
+  /// Keeps programs out that move or remove files of this kind. Hold it from `list` to the end of
+  /// `trim`. Empty for kinds and folders without a lock.
+  static Expected<Descriptor> lock(Kept kind, const DeviceRoot& root, FileSystem& files);
+
   KeptUse use() const;
 
-  /// Removes what exceeds the bounds. The newest log, and the records of `today`, always stay. Also
+  /// Removes what exceeds the bounds. In place of a file that cannot be removed, the next ones go.
+  /// The newest log, and the records of `today`, always stay. Also
   /// removes metadata that a killed process left without its log, when it was last changed more
   /// than a day before `now`, in seconds since 1970.
   TrimmedFiles trim(const Bounds& bounds, std::int64_t now);
@@ -67,7 +72,7 @@ class KeptFiles {
   Status listSetAside(const std::string& folder);
   void add(const std::string& path, std::int64_t seconds);
   bool stays(std::size_t index) const;
-  TrimmedFiles removeFirst(std::size_t count);
+  Status removeCompanions(const std::vector<std::string>& companions);
   void removeOrphans(std::int64_t now);
 
   Kept kind_;

@@ -17,6 +17,9 @@ constexpr std::int64_t kLargestReservePart = 8;
 // The first of these that exists holds the lock that lets one process tidy at a time.
 constexpr std::string_view kLockFolders[] = {"/run/tavrel", "/var/lib/tavrel", "/var/mobile"};
 
+// Bringing a large store down to its limit takes minutes.
+constexpr LockPatience kPatience{600'000, "it is tidying: try again later"};
+
 std::int64_t reserveOf(std::int64_t bytesInUse, std::int64_t days, const Bounds& bounds) {
   return std::min(kReserveDays * bytesInUse / std::max<std::int64_t>(days, 1),
                   bounds.bytes / kLargestReservePart);
@@ -38,7 +41,7 @@ void Tidy::trim(TidyReport& report) {
   const auto* const folder = std::ranges::find_if(
       kLockFolders, [&](auto path) { return FileSystem::status(root_.path(path)).has_value(); });
   // Without such a folder, there is nothing to remove.
-  if (folder != std::end(kLockFolders)) lock = files_.lockFolder(root_.path(*folder));
+  if (folder != std::end(kLockFolders)) lock = files_.lockFolder(root_.path(*folder), kPatience);
   if (!lock) return report.failures.push_back(lock.error().message);
   const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
   for (const KeptKind& kind : kKeptKinds) {
@@ -46,6 +49,11 @@ void Tidy::trim(TidyReport& report) {
     tidied.kind = &kind;
     tidied.bounds = limits->of(kind.kind);
     if (kind.kind == Kept::Store) continue;
+    const auto folderLock = KeptFiles::lock(kind.kind, root_, files_);
+    if (!folderLock) {
+      report.failures.push_back(folderLock.error().message);
+      continue;
+    }
     auto files = KeptFiles::list(kind.kind, root_, files_, store_.BHDaysSince1970());
     if (!files) {
       report.failures.push_back(files.error().message);

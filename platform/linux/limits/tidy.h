@@ -60,8 +60,8 @@ class Tidy {
         preferences_(preferences),
         store_(store) {}
 
-  /// Removes what exceeds the limits. Waits while another process does so. Writes failures to
-  /// `kTidyFailuresFile`.
+  /// Removes what exceeds the limits. Waits up to ten minutes while another process does so. Writes
+  /// failures to `kTidyFailuresFile`.
   TidyReport run();
 
   /// What is stored, with its bounds. Changes nothing.
