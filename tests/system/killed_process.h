@@ -4,6 +4,7 @@
 #include <cstddef>
 #include <fcntl.h>
 #include <functional>
+#include <gtest/gtest.h>
 #include <signal.h>
 #include <string>
 #include <sys/ptrace.h>
@@ -25,7 +26,7 @@ inline int forkProcess(const std::function<void()>& body,
 
 /// Runs `body` in a forked process that is killed before its system call number `calls`. With
 /// `meanwhile`, it is not killed: it pauses there while `meanwhile` runs, and then continues to its
-/// end. False when it ended before that call.
+/// end. False when it ended before that call; it must not end with a failure.
 inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& body,
                                const std::function<void()>& meanwhile = {}) {
   const int child = forkProcess([&] {
@@ -37,17 +38,23 @@ inline bool runUntilSystemCall(std::size_t calls, const std::function<void()>& b
   ::waitpid(child, &status, 0);
   // Every call stops the process twice: before and after.
   for (std::size_t stop = 0; stop < 2 * calls + 1; ++stop) {
-    ::ptrace(PTRACE_SYSCALL, child, nullptr, nullptr);
+    const int signal = stop == 0 || WSTOPSIG(status) == SIGTRAP ? 0 : WSTOPSIG(status);
+    ::ptrace(PTRACE_SYSCALL, child, nullptr, signal);
     ::waitpid(child, &status, 0);
-    if (WIFEXITED(status) || WIFSIGNALED(status)) return false;
+    if (WIFEXITED(status) || WIFSIGNALED(status)) {
+      EXPECT_EQ(status, 0) << "the process failed before system call " << calls;
+      return false;
+    }
   }
   if (meanwhile) {
     meanwhile();
     ::ptrace(PTRACE_DETACH, child, nullptr, nullptr);
+    ::waitpid(child, &status, 0);
+    EXPECT_EQ(status, 0) << "the process failed after system call " << calls;
   } else {
     ::kill(child, SIGKILL);
+    ::waitpid(child, &status, 0);
   }
-  ::waitpid(child, &status, 0);
   return true;
 }
 
