@@ -424,11 +424,13 @@ TEST_F(Recording, SignalHandlersRecord) {
 }
 
 TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
-  std::filesystem::create_directories("/tmp/tavrel-client-test/run/tavrel/stat");
+  std::string elsewhere = TAVREL_BUILD "/not-in-memory-XXXXXX";
+  ASSERT_NE(mkdtemp(elsewhere.data()), nullptr);
+  std::filesystem::create_directories(elsewhere + "/run/tavrel/stat");
   const std::tuple<const char*, BHClientStatus, const char*> cases[] = {
       {"/dev/shm/tavrel-absent/", BHClientStatusNoFolder,
        "the device has no folder /run/tavrel/stat: nothing is recorded"},
-      {"/tmp/tavrel-client-test", BHClientStatusNotInMemory,
+      {elsewhere.c_str(), BHClientStatusNotInMemory,
        "/run/tavrel/stat is not on a tmpfs: nothing is recorded"},
       {root.c_str(), BHClientStatusRecording, "values are recorded"},
   };
@@ -450,9 +452,9 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
       EXPECT_EQ(errno, 77);
     });
   }
-  EXPECT_TRUE(std::filesystem::is_empty("/tmp/tavrel-client-test/run/tavrel/stat"));
+  EXPECT_TRUE(std::filesystem::is_empty(elsewhere + "/run/tavrel/stat"));
   EXPECT_EQ(segments().size(), 1U);
-  std::filesystem::remove_all("/tmp/tavrel-client-test");
+  std::filesystem::remove_all(elsewhere);
 }
 
 TEST_F(Recording, TimersMeasureSecondsAndMilliseconds) {

@@ -377,11 +377,13 @@ TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {
               "\"" + name + "\" in " + folder.string() +
                   " is refused: Permission denied; let the user that folds read it");
   }
-  const std::string elsewhere = "/tmp/tavrel-client-test";
+  std::string elsewhere = TAVREL_BUILD "/not-in-memory-XXXXXX";
+  ASSERT_NE(mkdtemp(elsewhere.data()), nullptr);
   std::filesystem::create_directories(elsewhere + "/run/tavrel/stat");
   EXPECT_EQ(
       SegmentFolder::open(DeviceRoot(elsewhere)).error().message,
       elsewhere + "/run/tavrel/stat is not on a tmpfs: nothing is folded; mount a tmpfs there");
+  std::filesystem::remove_all(elsewhere);
 }
 
 TEST_F(FoldTest, AnotherFileOfTheNameIsLeftAlone) {
