@@ -1,5 +1,6 @@
 #include <chrono>
 #include <sys/mman.h>
+#include <sys/resource.h>
 #include <sys/socket.h>
 
 #include "device_services.h"
@@ -177,6 +178,10 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
 }
 
 TEST_F(ServiceTest, LosesNothingOfABurstAndLetsPeersBeyondTheLimitWait) {
+  rlimit descriptors{};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &descriptors), 0);
+  descriptors.rlim_cur = descriptors.rlim_max;
+  ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &descriptors), 0);
   listen();
   constexpr std::size_t kExcess = 3;
   constexpr std::int64_t kRounds = 5;
