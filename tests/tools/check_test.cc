@@ -165,7 +165,6 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   for (int i = 0; i < 3000; ++i)
     values += "scalar\t20000\tcom.example.key." + std::to_string(i) + "\t1\n";
   device.run("stat import -", values);
-  sync();
   expect("OK store: ", 0);
   device.write(store + ".corrupt-1", "");
   device.write(store + "-kept", "");
@@ -177,9 +176,12 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
       "WARNING limits: nothing removed since yesterday; " + device.path("/etc/tavrel/limits.plist"),
       1);
   std::filesystem::remove(device.path("/etc/tavrel/limits.plist"));
-  device.write("/var/lib/tavrel/tidy-failures", "no room\nnor time\n");
+  const char* const failures = "/var/lib/tavrel/tidy-failures";
+  device.write(failures, "no room\nnor time\n");
+  std::filesystem::last_write_time(
+      device.path(failures), std::filesystem::file_time_type::clock::now() - std::chrono::hours(3));
   expect(
-      "WARNING limits: nothing removed since yesterday; 'tavrelctl tidy' failed 0 s ago: no room\n",
+      "WARNING limits: nothing removed since yesterday; 'tavrelctl tidy' failed 3 h ago: no room\n",
       1);
   std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);
@@ -192,15 +194,13 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
 
 TEST_F(CheckTest, JudgesQueuesByTheirOldestLog) {
   writeRun(kHour, true);
-  const std::string kFolder = kSubmission;
   for (const auto& [place, age, line, status] :
        {std::tuple("pending", 3 * kHour, "OK queue pending: 1 log, the oldest filed 3 h ago\n", 0),
         {"pending", 50 * kHour, "WARNING queue pending: 2 logs, the oldest filed 2 days ago\n", 1},
         {"outbox", 8 * kDay, "CRITICAL queue outbox: 1 log, the oldest filed 8 days ago\n", 2},
         {"withheld", 900 * kDay, "OK queue withheld: 1 log, the oldest filed 900 days ago\n", 2},
         {"refused", kHour, "WARNING queue refused: 1 log, the oldest filed 60 min ago\n", 2}}) {
-    device.write(kFolder + place + "/" + logName(age) + ".log", "");
-    device.write(kFolder + place + "/" + logName(age) + ".metadata.plist", "");
+    device.fileLog(std::string(place) + "/" + logName(age), "", "{}");
     expect(line, status);
   }
 }
