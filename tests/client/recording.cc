@@ -4,6 +4,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <ctime>
+#include <sys/stat.h>
 
 namespace {
 constexpr std::size_t kLargePage = 16'384;
@@ -85,6 +86,7 @@ const std::string kPython =
         : "ASAN_OPTIONS=detect_leaks=0 LD_PRELOAD=$(cc -print-file-name=libasan.so) ";
 
 Recording::Recording() {
+  umask(022);  // files that other users may write are not trusted
   std::string made = "/dev/shm/tavrel-XXXXXX";
   root = mkdtemp(made.data());
   folder = root / "run/tavrel/stat";

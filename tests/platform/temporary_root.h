@@ -10,6 +10,7 @@
 #include <stdlib.h>
 #include <string>
 #include <string_view>
+#include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
 #include <vector>
@@ -48,6 +49,7 @@ class TemporaryRoot {
 
  private:
   static std::string makeFolder() {
+    umask(022);  // files that other users may write are not trusted
     // In memory where possible, because tests flush and rename thousands of times.
     const bool inMemory = access("/dev/shm", W_OK) == 0;
     const std::filesystem::path parent =
