@@ -1,5 +1,6 @@
 // tavrelctl as a whole: usage, preferences, property lists, logs, status.
 #include "base/limits.h"
+#include "base/version.h"
 #include "device.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -80,7 +81,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
     runTavrelctl(words, {.in = in, .out = out, .error = error, .errorIsJournal = true});
     EXPECT_EQ(error.str(), line);
   }
-  device.check("--version", prints("tavrelctl 0.1.0\n"));
+  device.check("--version", prints(format("tavrelctl %s\n", version())));
   for (const auto& help : {"--help", "prefs set --help", "log --help"})
     EXPECT_NE(device.run(help).out.find("Usage: "), std::string::npos) << help;
 }
