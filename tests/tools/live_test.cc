@@ -370,15 +370,16 @@ TEST(LiveTest, TheCatalogueHasTheChannelsOfThisMachine) {
 
 // The example includes every daily figure of this machine, and passes the whitelist check.
 TEST(LiveTest, TheExampleListsTheDailyFigures) {
+  const TemporaryDevice device;
   const std::string file = TAVREL_EXAMPLES "/whitelist-live.plist";
-  EXPECT_EQ(TemporaryDevice::runAt("/", "whitelist check " + file).status, 0);
+  EXPECT_EQ(device.run("whitelist check " + file).status, 0);
   const Outcome list = TemporaryDevice::runAt("/", "report list --live --category 0x100 --json");
   const auto json = nlohmann::json::parse(list.out);
   EXPECT_GE(json["channels"].size(), 10U);
   CommandLine explain{"whitelist", "explain", "--json", "--file", file};
   for (const auto& channel : json["channels"])
     explain.push_back("com.norvane.ioreport." + channel["name"].get<std::string>());
-  const auto explained = nlohmann::json::parse(TemporaryDevice::runAt("/", explain).out);
+  const auto explained = nlohmann::json::parse(device.run(explain).out);
   for (const auto& key : explained["keys"])
     EXPECT_TRUE(key["scalar"]["rule"] == "exact" || key["scalar"]["rule"] == "prefix") << key;
 }
