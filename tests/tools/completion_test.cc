@@ -126,7 +126,7 @@ TEST(CompletionTest, CompletesValues) {
       {"log preview --day t", {"today"}}};
   for (const auto& [line, words] : kCases)
     EXPECT_EQ(completeInBash(device, line), words) << line;
-  EXPECT_EQ(completeInBash(device, "stat list --day 2").count("2024-10-04"), 0U);
+  EXPECT_EQ(completeInBash(device, "stat list --day 2").size(), 31U);
 }
 
 TEST(CompletionTest, MakesThePageOfATemplate) {
