@@ -246,12 +246,15 @@ TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
                   "_call_program() { eval \"$argv[2,-1]\" }; compadd() { }\n"
                   "words=(tavrel-fleet --database h:1/d compare \"\"); . " +
                   folder + "/script.zsh'"}};
+  int tried = 0;
   for (const auto& [shell, command] : shells) {
     if (std::system(("command -v " + shell + " > /dev/null").c_str()) != 0) continue;
+    ++tried;
     root.write("/asked", "");
     EXPECT_EQ(std::system((command + " > /dev/null").c_str()), 0) << shell;
     EXPECT_EQ(contentOf(folder + "/asked"), "--database h:1/d completion versions\n") << shell;
   }
+  if (tried == 0) GTEST_SKIP() << "neither fish nor zsh";
 }
 
 TEST_F(QuestionCommands, AreOnTheManualPage) {

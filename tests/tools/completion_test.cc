@@ -82,7 +82,7 @@ void expectAll(const TemporaryDevice& device, const std::string& path, int& comm
 
 TEST(CompletionTest, HasEveryCommandAndOption) {
   const TemporaryDevice device;
-  int commands = 0;
+  int commands = 0, shells = 0;
   expectAll(device, "", commands);
   EXPECT_GE(commands, 60);
   for (const char* const shell : {"zsh", "fish"}) {
@@ -93,11 +93,13 @@ TEST(CompletionTest, HasEveryCommandAndOption) {
         std::string(shell) + " -n " TAVREL_BUILD "/completions/" + shell + "/*tavrelctl*";
     if (std::system(has.c_str()) != 0) continue;
     EXPECT_EQ(std::system(parses.c_str()), 0) << shell;
+    ++shells;
   }
   const std::string zsh = device.run("completion zsh").out;
   for (const char* const spec : {"'(--root)--root=[Folder that holds", "--day=["})
     EXPECT_NE(zsh.find(spec), zsh.npos) << spec;
   EXPECT_EQ(device.run("--help").out.find("completion"), std::string::npos);
+  if (shells == 0) GTEST_SKIP() << "neither fish nor zsh: their syntax is not checked";
 }
 
 TEST(CompletionTest, CompletesValues) {
