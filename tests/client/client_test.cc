@@ -6,7 +6,6 @@
 #include <cstring>
 #include <dlfcn.h>
 #include <grp.h>
-#include <random>
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/time.h>
@@ -58,44 +57,6 @@ TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   expectEachOnce(records["series"], std::uint64_t{kThreads} * kPerThread, dropped);
   EXPECT_GT(records["series"].size(), std::size_t{kBHChunkCount} * kBHChunkRecords / 2);
   EXPECT_TRUE(segments().empty());
-}
-
-TEST_F(Recording, AKilledProgramLeavesEverythingItRecorded) {
-  auto& progress = shared<std::atomic<int>>();
-  std::mt19937 random(12);
-  const char* const rounds = std::getenv("TAVREL_KILL_ROUNDS");  // set for long manual runs
-  for (long round = rounds ? std::strtol(rounds, nullptr, 10) : 200; round > 0; --round) {
-    SCOPED_TRACE(round);
-    progress = 0;
-    scalars.clear();
-    records.clear();
-    const pid_t child = start([&] {
-      for (int i = 0; i < 200'000; ++i) {
-        record(i);
-        add(1);
-        set(i);
-        progress.store(i + 1, std::memory_order_release);
-      }
-      pause();
-    });
-    const int until = static_cast<int>(random() % 3000);
-    while (progress < until)
-      sched_yield();
-    if (round % 2 == 0) fold();
-    kill(child, SIGKILL);
-    EXPECT_EQ(waitFor(child), SIGKILL);
-    fold();
-    ASSERT_TRUE(segments().empty());
-
-    const std::int64_t done = progress;
-    auto& series = records["series"];
-    std::sort(series.begin(), series.end());
-    for (std::size_t i = 0; i < series.size(); ++i)
-      ASSERT_EQ(series[i], static_cast<double>(i));
-    const std::int64_t last = done > 0 ? scalar("gauge") + 1 : done;
-    for (const std::int64_t left : {std::ssize(series), scalar("count"), last})
-      ASSERT_TRUE(left == done || left == done + 1) << left << " of " << done;
-  }
 }
 
 TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {

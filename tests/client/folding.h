@@ -12,10 +12,9 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "recording.h"
+#include "tests/platform/temporary_root.h"
 
 namespace tavrel {
-
-using Lines = std::vector<std::string>;
 
 inline int fromEnvironment(const char* name, int otherwise) {
   const char* const text = std::getenv(name);  // set for long manual runs
@@ -25,11 +24,6 @@ inline int fromEnvironment(const char* name, int otherwise) {
 /// Folds into the device's store, and reads what it holds.
 class FoldTest : public Recording {
  protected:
-  struct KeptLog final : SystemLog {
-    void write(LogLevel, std::string_view message) override { lines.emplace_back(message); }
-    Lines lines;
-  };
-
   FoldTest() {
     chmod(root.c_str(), 0755);
     chmod(folder.c_str(), 01777);
