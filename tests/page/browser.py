@@ -1,6 +1,5 @@
 """Headless Chromium, controlled with the DevTools protocol over a pipe."""
 
-import base64
 import json
 import os
 import shutil
@@ -103,11 +102,3 @@ class Browser:
         if "exceptionDetails" in result:
             raise AssertionError(result["exceptionDetails"])
         return result["result"].get("value")
-
-    def screenshot(self, file, height=None):
-        size = self.call("Page.getLayoutMetrics")["cssContentSize"]
-        picture = self.call("Page.captureScreenshot", captureBeyondViewport=True, clip={
-            "x": 0, "y": 0, "width": size["width"], "height": min(size["height"], height or 16000),
-            "scale": 1})
-        with open(file, "wb") as out:
-            out.write(base64.b64decode(picture["data"]))

@@ -20,10 +20,10 @@ class Device:
         self.root, self.tool = root, tool
         random.seed(1)
 
-    def run(self, *arguments, text=None, status=0):
+    def run(self, *arguments, text=None):
         done = subprocess.run([self.tool, "--root", self.root, *arguments], input=text, text=True,
                               stdout=subprocess.PIPE, stderr=subprocess.PIPE, check=False)
-        if status is not None and done.returncode != status:
+        if done.returncode != 0:
             raise AssertionError(f"{arguments}: status {done.returncode}: {done.stderr}")
         return done
 
@@ -36,7 +36,7 @@ class Device:
             else:
                 plistlib.dump(value, file)
 
-    def statistics(self, days, hole=(), scalars=8, distributions=3, values=48):
+    def statistics(self, days, hole):
         """Adds days up to yesterday, except those whose number, back from today, is in `hole`."""
         lines = []
         for back in range(days, 0, -1):
@@ -47,15 +47,15 @@ class Device:
             rows = {"com.norvane.usage.processes": 180 + int(40 * wave) + day % 7,
                     "com.norvane.usage.disk.free_mib": 77000 - 120 * (days - back),
                     "com.norvane.ioreport.nvme0.used_pct": 20 + (days - back) // 15}
-            for i in range(scalars - len(rows)):
-                rows[f"com.example.app{i}.starts"] = random.randrange(10 ** (i % 7 + 1))
+            for i in range(5):
+                rows[f"com.example.app{i}.starts"] = random.randrange(10 ** (i + 1))
             for key in HOSTILE if back < 3 else ():
                 rows[key] = 1234567
             lines += [f"scalar\t{day}\t{key}\t{value}" for key, value in rows.items()]
-            for i in range(distributions):
+            for i in range(3):
                 key = "com.norvane.usage.memory.used_percent" if i == 0 else f"com.example.app{i}.ms"
                 lines += [f"value\t{day}\t{key}\t{60 * n}\t{random.lognormvariate(3, 0.3 + 0.1 * wave):.4f}"
-                          for n in range(values)]
+                          for n in range(48)]
         self.run("stat", "import", "-", text="\n".join(lines) + "\n")
 
     def furnish(self, examples):

@@ -1,9 +1,7 @@
 #!/usr/bin/env python3
 """Opens pages of a fleet in headless Chromium and looks for faults that readers would see.
 
-    fleet_page_test.py TAVREL_FLEET [FOLDER]
-
-With FOLDER, also saves the page there, with a picture at each width in both colour schemes.
+    fleet_page_test.py TAVREL_FLEET
 """
 
 import datetime
@@ -11,14 +9,13 @@ import math
 import os
 import plistlib
 import random
-import shutil
 import subprocess
 import sys
 import tempfile
 
 from browser import Browser
 from device import LONG, OVERRIDE, SCRIPT
-from inspection import TURNED, WIDTHS, expect, inspect
+from inspection import TURNED, expect, inspect
 
 OLD, NEW = "Pellio 4.1 (16Q210)", f"Pellio 4.2 <b>{OVERRIDE}</b>"
 WEAR = "com.norvane.ioreport.nvme0.used_pct"
@@ -81,12 +78,6 @@ def main():
         fleet("page", "-o", page)
         # 7 changes, 2 bars of versions, 3 of regions, days, 28 of histograms.
         inspect(browser, page, 41)
-        if len(sys.argv) > 2:
-            shutil.copy(page, sys.argv[2])
-            for width in WIDTHS:
-                for scheme in ("light", "dark"):
-                    browser.open(page, width, scheme)
-                    browser.screenshot(os.path.join(sys.argv[2], f"{width}-{scheme}.png"))
         check_content(browser)
     print("no faults")
 
