@@ -74,10 +74,17 @@ TEST_F(FileSystemTest, RemovesTemporaryFilesOnceTheyAreOld) {
 
 TEST_F(FileSystemTest, SaysWhySettingsAreNotTrusted) {
   write("/settings", "");
-  EXPECT_EQ(reasonToDistrust(root.path("/settings")), "");
-  fs::permissions(root.path("/settings"), fs::perms(0660));
-  EXPECT_EQ(reasonToDistrust(root.path("/settings")),
-            "users other than root may write it: make root its owner and set mode 0644");
+  const std::string path = root.path("/settings");
+  const std::string writable =
+      "users other than root may write it: make root its owner and set mode 0644";
+  for (const auto& [owner, mode, reason] : {std::tuple(geteuid(), 0644, std::string()),
+                                            {geteuid(), 0620, writable},
+                                            {geteuid(), 0602, writable},
+                                            {65534U, 0600, writable}}) {
+    if (chown(path.c_str(), owner, getegid()) != 0) continue;  // not root
+    fs::permissions(path, fs::perms(mode));
+    EXPECT_EQ(reasonToDistrust(path), reason) << owner << ' ' << mode;
+  }
   EXPECT_EQ(reasonToDistrust(root.path("/missing")),
             "its owner is unknown: No such file or directory");
 }

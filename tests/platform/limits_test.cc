@@ -2,24 +2,21 @@
 
 #include <cstring>
 #include <numeric>
-#include <sqlite3.h>
 #include <sys/file.h>
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/limits/tidy.h"
 #include "platform/persisted_state.h"
-#include "platform/store_path.h"
+#include "store_fixture.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::int32_t kToday = 20784;
 constexpr const char* kPending = "/var/mobile/Library/Logs/Submission/pending/";
 
 using Days = std::vector<std::int32_t>;
 
-class LimitsTest : public testing::Test, protected DeviceServices {
+class LimitsTest : public StoreTest {
  protected:
   void limit(const plist::Dictionary& content) {
     write("/etc/tavrel/limits.plist", *coding.encodeXml(content));
@@ -43,18 +40,6 @@ class LimitsTest : public testing::Test, protected DeviceServices {
     std::iota(days.begin(), days.end(), first);
     return days;
   }
-  Lines sql(const std::string& text) {
-    sqlite3* handle = nullptr;
-    EXPECT_EQ(sqlite3_open(store.path().c_str(), &handle), SQLITE_OK);
-    Lines column;
-    const auto add = [](void* out, int count, char** values, char**) {
-      static_cast<Lines*>(out)->emplace_back(values[count - 1]);
-      return 0;
-    };
-    EXPECT_EQ(sqlite3_exec(handle, text.c_str(), add, &column, nullptr), SQLITE_OK) << text;
-    sqlite3_close(handle);
-    return column;
-  }
   void setLastRun(std::int32_t day) {
     preferences.ZTXPreferencesSetValue(kLastRunDayKey, day, kTavrelDomain);
   }
@@ -66,7 +51,7 @@ class LimitsTest : public testing::Test, protected DeviceServices {
     return found;
   }
 
-  SqliteStore store{root, clock, preferences, log};
+  SqliteStore& store = *store_;
 };
 
 TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
@@ -109,15 +94,11 @@ TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
   limit({{"Store", plist::Dictionary{{"Days", 36'500}}}});
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_FALSE(std::filesystem::exists(root.path(kTidyFailuresFile)));
-  for (const auto& [owner, mode] :
-       {std::pair(geteuid(), 0620), {geteuid(), 0602}, {65534U, 0600}}) {
-    if (chown(path.c_str(), owner, getegid()) != 0) continue;  // not root
-    ASSERT_EQ(chmod(path.c_str(), static_cast<mode_t>(mode)), 0);
-    EXPECT_EQ(
-        tidy().failures,
-        Lines{path + ": users other than root may write it: make root its owner and set mode 0644: "
-                     "nothing is removed until it is repaired"});
-  }
+  std::filesystem::permissions(path, std::filesystem::perms(0620));
+  EXPECT_EQ(
+      tidy().failures,
+      Lines{path + ": users other than root may write it: make root its owner and set mode 0644: "
+                   "nothing is removed until it is repaired"});
   EXPECT_EQ(daysHeld().size(), 201U);
 }
 
@@ -348,7 +329,7 @@ TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {
   struct Stuck : FileSystem {
     explicit Stuck(const std::string& path) : lock(path) {}
     int removeFile(const char* path) override {
-      const Descriptor other(open(lock.c_str(), O_RDONLY));
+      const Descriptor other(::open(lock.c_str(), O_RDONLY));
       isLocked = isLocked && other && flock(other.get(), LOCK_EX | LOCK_NB) != 0;
       const std::string log = path;
       if (const auto day = log.find("20261125"); day != log.npos) {
