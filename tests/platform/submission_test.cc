@@ -8,6 +8,7 @@
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/json_line.h"
 #include "platform/linux/logs/log_file_name.h"
+#include "tests/fakes/fake_platform.h"
 
 namespace tavrel {
 namespace {
@@ -18,32 +19,14 @@ const std::string kContent(10'000, 'L');
 
 constexpr std::int32_t kToday = 20784;  // the day of the fixed clock
 
-/// A store without rows.
-class DayStore final : public StatisticsStore {
-  struct NoRows final : BHHistory {
-    void scalarsForKeyPrefix(std::string_view, std::int64_t, std::int64_t,
-                             const ScalarRowHandler&) override {}
-    void distributionsForKeyPrefix(std::string_view, std::int64_t, std::int64_t,
-                                   const DistributionRowHandler&) override {}
-  };
-
- public:
-  std::int32_t BHDaysSince1970() override { return kToday; }
-  plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
-  bool BHClientCheckpoint() override { return true; }
-  void BHClientSetValueForScalarKey(std::string_view, std::int64_t) override {}
-  std::unique_ptr<BHHistory> initWithDefaultPath() override { return std::make_unique<NoRows>(); }
-};
-
 struct Service : ProcessServices {
   Service(const DeviceRoot& root, FileSystem& fileSystem)
       : ProcessServices(root, fileSystem),
         version(root, fileSystem, coding, log),
-        submission(root, services(fileSystem)) {}
-  explicit Service(const DeviceRoot& root)
-      : ProcessServices(root),
-        version(root, files, coding, log),
-        submission(root, services(files)) {}
+        submission(root, services(fileSystem)) {
+    store.today = kToday;
+  }
+  explicit Service(const DeviceRoot& root) : Service(root, files) {}
 
   FileSubmission::Services services(FileSystem& fileSystem) {
     return {fileSystem, coding, preferences, preferences, days, version, clock, log};
@@ -65,7 +48,8 @@ struct Service : ProcessServices {
     });
   }
 
-  DayStore store;
+  fakes::Journal journal;
+  fakes::FakeStore store{journal};
   ReportedDays days{store};
   LinuxSystemVersion version;
   FileSubmission submission;
