@@ -9,7 +9,6 @@
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
 #include "tests/platform/temporary_root.h"
-#include "tests/system/killed_process.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -246,7 +246,6 @@ TEST(EngineFaults, BoundsItsPatience) {
   expect("", "the server answered with status 404: check the address and the server's log", 1);
   answerWith("200 OK", "1");
   answer.replace(answer.find(": 1"), 3, ": 9");
-  const std::string slow = answer;
   server.closesAfterAnswer = true;
   expect("", "transfer closed with 8 bytes remaining to read: the answer is incomplete; try again",
          1);

@@ -257,18 +257,6 @@ TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
   if (tried == 0) GTEST_SKIP() << "neither fish nor zsh";
 }
 
-TEST_F(QuestionCommands, AreOnTheManualPage) {
-  root.write("/page.in", "@command page\nProse.\n");
-  EXPECT_EQ(
-      run(file, {"completion", "man", root.root.path("/page.in")}).out,
-      ".TP\n\\fBpage\\fR \\fB\\-\\-output\\fR \\fIFILE\\fR [\\fB\\-\\-days\\fR \\fIDAYS\\fR] "
-      "[\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR]\nProse.\n.RS\n.TP\n\\fB\\-o\\fR, "
-      "\\fB\\-\\-output\\fR \\fIFILE\\fR\nThe page; \\- is standard output.\n.TP\n"
-      "\\fB\\-\\-days\\fR \\fIDAYS\\fR\nFIRST..LAST, one day, or a number of days up to "
-      "the newest (default: all).\n.TP\n\\fB\\-\\-devices\\-at\\-least\\fR \\fIK\\fR\nShow no "
-      "group of fewer devices (default 10, at least 3).\n.RE\n");
-}
-
 TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
   std::ostringstream out;
   CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F");
