@@ -55,18 +55,6 @@ struct DailyRunTest : ::testing::Test {
   }
 };
 
-TEST_F(DailyRunTest, RunsOncePerDay) {
-  runDailyIfNeeded(fake.platform, {});
-  EXPECT_EQ(fake.journal, kGatedTasks);
-  EXPECT_EQ(storedDay(), plist::Value(19999));
-  EXPECT_EQ(fake.log.messages(), (Messages{"daily tasks for day 19999", kNotPermitted, kUnread}));
-
-  fake.journal.clear();
-  runDailyIfNeeded(fake.platform, {});
-  EXPECT_EQ(fake.journal, fakes::Journal{});
-  EXPECT_EQ(fake.log.messages().back(), "Day unchanged since last run");
-}
-
 TEST_F(DailyRunTest, RepeatsADayWhoseStatisticsAreNotKept) {
   fake.store.keepsValues = false;
   Messages steps;
@@ -173,6 +161,11 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   EXPECT_EQ(fake.journal, kGatedTasks);
   EXPECT_EQ(fake.log.messages(), (Messages{"tavrel started", "daily tasks for day 19999",
                                            kNotPermitted, kUnread, "tavrel ended"}));
+  EXPECT_EQ(storedDay(), plist::Value(19999));
+  run({"tavrel", "-d"});
+  EXPECT_EQ(fake.journal, fakes::Journal{});
+  EXPECT_EQ(fake.log.messages(),
+            (Messages{"tavrel started", "Day unchanged since last run", "tavrel ended"}));
 
   run({"tavrel", "-f"});
   EXPECT_EQ(fake.journal, kTasks);
