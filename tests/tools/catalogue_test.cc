@@ -25,12 +25,6 @@ std::string keyOf(const Entry* entry) {
   return entry ? std::string(entry->key) : "none";
 }
 
-std::string textOf(const std::filesystem::path& file) {
-  std::ostringstream text;
-  text << std::ifstream(file).rdbuf();
-  return text.str();
-}
-
 TEST(CatalogueTest, FindsRows) {
   const Entry* const processes = catalogue::findStatistic("com.norvane.usage.processes");
   ASSERT_TRUE(processes);
@@ -125,7 +119,7 @@ TEST(CatalogueTest, HasWhatIsRecorded) {
     for (const auto& file :
          std::filesystem::recursive_directory_iterator(TAVREL_SOURCE "/" + std::string(room))) {
       if (!file.is_regular_file()) continue;
-      const std::string text = textOf(file.path());
+      const std::string text = contentOf(file.path());
       for (std::sregex_iterator at(text.begin(), text.end(), literal), end; at != end; ++at) {
         const std::string key = (*at)[1];
         if (others.contains(key)) continue;
@@ -208,14 +202,14 @@ TEST(CatalogueTest, RefusesBrokenDocuments) {
                            documents.string(), rows, log)
                         .c_str());
     // CMake wraps long lines.
-    const std::string said = std::regex_replace(textOf(log), std::regex("\\s+"), " ");
+    const std::string said = std::regex_replace(contentOf(log), std::regex("\\s+"), " ");
     EXPECT_EQ(WEXITSTATUS(status), fault.empty() ? 0 : 1) << said;
     const std::string where = fault.empty() ? "" : (documents / "t.md:").string() + fault + " ";
     EXPECT_NE(said.find(where), std::string::npos) << said << "\nlacks\n" << where;
     if (!fault.empty()) continue;
     EXPECT_NE(
-        textOf(rows).find("{\"a<x>\", \"count\", \"\", Since::Unknown, \"\", \"\"},\n    "
-                          "{\"a.b\", \"count\", \"Things; others\", Since::Now, \"\", \"\"},"),
+        contentOf(rows).find("{\"a<x>\", \"count\", \"\", Since::Unknown, \"\", \"\"},\n    "
+                             "{\"a.b\", \"count\", \"Things; others\", Since::Now, \"\", \"\"},"),
         std::string::npos);
   }
 }

@@ -17,10 +17,6 @@ plist::Date ago(double seconds) {
   return plist::Date::since1970(now.count() - seconds);
 }
 
-std::int64_t today() {
-  return static_cast<std::int64_t>(ago(0).secondsSince1970() / kDay);
-}
-
 std::string isoAgo(double seconds) {
   return isoDateText(plist::Date::sinceEpoch(std::floor(ago(seconds).secondsSinceEpoch())));
 }

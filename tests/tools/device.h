@@ -2,6 +2,8 @@
 #pragma once
 
 #include <algorithm>
+#include <chrono>
+#include <cstdint>
 #include <filesystem>
 #include <fstream>
 #include <gtest/gtest.h>
@@ -23,6 +25,12 @@ using namespace nlohmann::literals;
 inline constexpr const char* kWhitelistFile =
     "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
 inline const std::string kSubmission = "/var/mobile/Library/Logs/Submission/";
+
+/// The number of the current day.
+inline std::int32_t today() {
+  const auto now = std::chrono::system_clock::now().time_since_epoch();
+  return static_cast<std::int32_t>(std::chrono::duration_cast<std::chrono::days>(now).count());
+}
 
 /// An XML property list, written here as JSON.
 inline std::string xmlOf(std::string_view json) {

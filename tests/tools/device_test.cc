@@ -11,10 +11,6 @@ namespace {
 
 using namespace std::chrono_literals;
 
-struct SilentLog final : SystemLog {
-  void write(LogLevel, std::string_view) override {}
-};
-
 TEST(Send, SendsWhatTheServiceUnderstands) {
   const TemporaryDevice device;
   device.check(
@@ -23,7 +19,7 @@ TEST(Send, SendsWhatTheServiceUnderstands) {
             ": No such file or directory; start tavrel or its socket unit"));
 
   const DeviceRoot root(device.path(""));
-  SilentLog log;
+  KeptLog log;
   LinuxEventLoop loop;
   SocketServices services(loop, root, log);
   const auto listener = services.createListener("com.norvane.tallied.tavrel");

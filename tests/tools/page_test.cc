@@ -1,19 +1,11 @@
 // tavrelctl page
-#include <chrono>
 #include <regex>
 
-#include "base/civil_time.h"
 #include "device.h"
 #include "tools/shared/day_argument.h"
 
 namespace tavrel {
 namespace {
-
-std::int32_t today() {
-  const auto now = std::chrono::system_clock::now().time_since_epoch();
-  return static_cast<std::int32_t>(std::chrono::duration_cast<std::chrono::seconds>(now).count() /
-                                   kSecondsPerDay);
-}
 
 std::ptrdiff_t countOf(const std::string& text, const std::string& expression) {
   const std::regex pattern(expression);
