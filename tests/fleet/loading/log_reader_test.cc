@@ -209,8 +209,7 @@ TEST(LogReaderTest, NamesWhatIsWrong) {
       {"2026-11-25T", "2100-01-01T", "BHLogCreationDate: is not within the years 2000 to 2099"},
       {"2026-11-25T", "2026-11-23T", "BHLogCreationDate: is before the day that the log reports"},
       {"2026-11-25T03:04:05Z", "yesterday",
-       "BHLogCreationDate: \"yesterday\" is not a date: give one that exists, as "
-       "YYYY-MM-DDTHH:MM:SSZ"},
+       "BHLogCreationDate: \"yesterday\" is not a date of the form YYYY-MM-DDTHH:MM:SSZ"},
       {"UTF-8", "ISO-8859-1", "is in the encoding \"ISO-8859-1\": only UTF-8 is read"},
       {"<plist version=\"1.0\">", "<!DOCTYPE plist [<!ENTITY a \"b\">]><plist>",
        "declares an entity"},
