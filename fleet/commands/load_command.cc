@@ -78,7 +78,8 @@ void addLoadCommand(Command top, FleetContext& context) {
   auto options = std::make_shared<LoadOptions>();
   command.addOption("PATH", options->request.paths, "Logs, folders with logs, tar archives")
       .typeName("")
-      .required();
+      .required()
+      .notEmpty();
   command
       .addOption("--metadata", options->request.uploadLines,
                  "Lines of JSON in which a server records the metadata of uploads")

@@ -138,8 +138,8 @@ TEST(EngineFaults, TellsReadersWhatTheyNeed) {
   const std::string failure = openingFailure(path, OpenMode::kRead);
   ASSERT_EQ(seteuid(0), 0);
   EXPECT_EQ(failure, path +
-                         ": attempt to write a readonly database: readers must be able to write "
-                         "in its folder too; or query a copy");
+                         ": attempt to write a readonly database: make its folder writable for "
+                         "readers, or query a copy");
 }
 
 TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {

@@ -40,6 +40,9 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {"log show --raw --json", "--raw excludes --json: see 'tavrelctl log show --help'"},
       {CommandLine{"log", "preview", "--day", ""},
        "--day: must not be empty: see 'tavrelctl log preview --help'"},
+      {"erase --key= --yes", "--key: must not be empty: see 'tavrelctl --help'"},
+      {CommandLine{"plist", "convert", ""},
+       "FILE: must not be empty: see 'tavrelctl plist convert --help'"},
       {CommandLine{"whitelist", "diff", "", ""},
        "OLD: must not be empty: see 'tavrelctl whitelist diff --help'"},
       {CommandLine{"whitelist", "check", ""},
@@ -49,11 +52,12 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {CommandLine{"records", "list", "--type", ""},
        "--type: must not be empty: see 'tavrelctl records list --help'"},
       {"records list --type 0x10",
-       "--type: not a type of records: 0x10: give a number such as 172: see 'tavrelctl records "
+       "--type: give a number up to 4294967295, in decimal digits, not 0x10: see 'tavrelctl "
+       "records "
        "list --help'"},
       {"stat collect --seconds -1",
-       "--seconds: not a number of seconds: -1: give 0 or more: see 'tavrelctl stat collect "
-       "--help'"}};
+       "--seconds: give a number up to 4294967295, in decimal digits, not -1: see 'tavrelctl stat "
+       "collect --help'"}};
   for (const auto& [command, error] : kCases)
     device.check(command, fails(error, 2));
   const std::string none = device.path("/none");

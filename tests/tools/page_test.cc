@@ -108,10 +108,11 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
 }
 
 TEST_F(PageTest, EstimatesHowLongDrivesLast) {
-  // The last three had a predecessor of the same name.
+  // The last four had a predecessor of the same name.
   const std::tuple<const char*, int, int> wear[] = {
-      {"nvme3", 11, 40}, {"nvme3", 1, 50}, {"nvme4", 11, 10}, {"nvme4", 10, 59}, {"nvme4", 1, 60},
-      {"nvme5", 11, 20}, {"nvme5", 10, 2}, {"nvme5", 1, 24},  {"nvme6", 11, 40}, {"nvme6", 1, 50}};
+      {"nvme3", 11, 40}, {"nvme3", 1, 50},  {"nvme4", 11, 10}, {"nvme4", 10, 59},
+      {"nvme4", 1, 60},  {"nvme5", 11, 20}, {"nvme5", 10, 2},  {"nvme5", 1, 24},
+      {"nvme6", 11, 40}, {"nvme6", 1, 50},  {"nvme7", 11, 40}};
   std::string rows;
   for (const auto& [drive, ago, percent] : wear)
     rows +=
@@ -124,14 +125,16 @@ TEST_F(PageTest, EstimatesHowLongDrivesLast) {
   writeDrive("nvme4", "nvme", R"("used_pct": 60, "power_on_hours": 2304)");
   writeDrive("nvme5", "nvme", R"("used_pct": 24, "power_on_hours": 720)");
   writeDrive("nvme6", "nvme", R"("used_pct": 3, "power_on_hours": 720)");
+  writeDrive("nvme7", "nvme", R"("used_pct": 3)");
   writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
   writeDrive("sda", "ata", R"("smart_good": 0)");
   expect(textOf(), {"About 2.5 years of operation at the pace of its life so far",
                     "Its rated life is used up", "Not known yet: no wear so far",
                     "About 50 days at the pace of the days on this page",
                     "About 64 days of operation at the pace of its life so far",
-                    "About 95 days of operation at the pace of its life so far",
+                    "About 31 days at the pace of the days on this page",
                     "About 2.7 years of operation at the pace of its life so far",
+                    "Not known yet: it has replaced another drive on these days",
                     "Not known yet: its wear has not changed on these days",
                     "Not known: the drive reports no wear", "failing, SMART status is failing"});
 }

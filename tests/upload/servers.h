@@ -82,7 +82,7 @@ class Nginx {
       make device -subj /CN=device-7/O=Example,CN=other $signed &&
       make forged -subj /CN=device-8 -CA device.crt -CAkey device.key &&
       cat device.crt >>forged.crt &&
-      exec nginx -p "$0" -c nginx.conf -e error.log)";
+      PATH=$PATH:/usr/sbin exec nginx -p "$0" -c nginx.conf -e error.log)";
   void end() {
     if (process == 0) return;
     kill(process, SIGQUIT);

@@ -10,6 +10,7 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/files/system_error.h"
 #include "platform/linux/limits/device_limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
@@ -107,7 +108,7 @@ void checkStore(CheckScene& scene) {
   } else if (errno == ENOENT || errno == ENOTDIR) {
     addFinding(check, CheckState::Ok, "none yet");
   } else {
-    addFinding(check, CheckState::Unknown, path + " cannot be checked: run as root");
+    addFinding(check, CheckState::Unknown, systemError("check", path).message);
   }
   checkCompanions(scene, path, check);
   scene.checks.push_back(std::move(check));

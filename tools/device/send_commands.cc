@@ -148,7 +148,8 @@ void addSendCommands(Command app, ToolContext& context) {
       .addOption("FILE", *file,
                  "Property list or JSON: an array of dictionaries with \"bundle_id\", \"version\", "
                  "\"uuid\", and \"orbo_id\" and \"arch\" unless 0; - for standard input")
-      .required();
+      .required()
+      .notEmpty();
   deliverCommand.onRun([&context, file] { deliver(context, *file); });
 }
 

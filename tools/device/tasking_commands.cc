@@ -191,7 +191,9 @@ void addTaskingCommands(Command app, ToolContext& context) {
   const Command scheduleCommand =
       group.addCommand("schedule", "Check a tasking, a property list or JSON, and schedule it");
   auto path = std::make_shared<std::string>();
-  scheduleCommand.addOption("FILE", *path, "The tasking; - for standard input").required();
+  scheduleCommand.addOption("FILE", *path, "The tasking; - for standard input")
+      .required()
+      .notEmpty();
   scheduleCommand.onRun([&context, path] { schedule(context, *path); });
 
   const Command clearCommand = group.addCommand("clear", "Remove the scheduled tasking");

@@ -195,7 +195,8 @@ void addLogCommands(Command app, ToolContext& context) {
       .addOption("FILE", arguments->file,
                  "A log of 'log list' or the beginning of its name, a path, - for standard input, "
                  "or latest, the last daily one")
-      .showDefault();
+      .showDefault()
+      .notEmpty();
   const Option raw =
       showCommand.addFlag("--raw", arguments->raw, "Print the log's bytes unchanged");
   raw.excludes(context.addJsonOption(showCommand));

@@ -44,39 +44,41 @@ std::optional<double> daysLeft(double percentUsed, double inDays, double percent
   return std::max(100 - percentNow, 0.0) * inDays / percentUsed;
 }
 
+// The wear that the daily run stored over the days of the page.
+struct Trend {
+  double growth = 0;  // in percent
+  double inDays = 0;
+  bool isReplacement = false;  // earlier days were those of another drive
+};
+
 // The kernel gives the name of a drive to its replacement. Between two values of one drive, wear
 // does not shrink, and does not grow by more than a step of the figure or a pace that would wear
 // out the drive in weeks.
-bool isOfOneDrive(const ByDay<std::int64_t>& days, const Disk& disk, const Wear& wear) {
+Trend trendOf(const PageScene& scene, const Disk& disk, const Wear& wear) {
+  Trend trend;
+  const auto known = scene.recorded.scalars.find(
+      format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
+  if (known == scene.recorded.scalars.end() || known->second.days.empty()) return trend;
   constexpr double kMostPerDay = 5;
   constexpr double kSecondsPerDay = 86'400;
   const double step = wear.figure == "used_pct" ? 1 : 10;
-  double lastDay = days.front().first;
-  auto lastPercent = static_cast<double>(days.front().second);
-  const auto follows = [&](double day, std::int64_t value) {
+  double lastDay = known->second.days.front().first;
+  auto lastPercent = static_cast<double>(known->second.days.front().second);
+  const auto follow = [&](double day, std::int64_t value, bool isRecorded) {
     const auto percent = static_cast<double>(value);
     const double grown = percent - std::exchange(lastPercent, percent);
     const double inDays = day - std::exchange(lastDay, day);
-    return grown >= 0 && grown <= std::max(step, kMostPerDay * inDays);
+    if (grown < 0 || grown > std::max(step, kMostPerDay * inDays)) {
+      trend = {0, 0, true};
+    } else if (isRecorded) {
+      trend.growth += grown;
+      trend.inDays += inDays;
+    }
   };
-  return std::ranges::all_of(days, [&](const auto& at) { return follows(at.first, at.second); }) &&
-         follows(static_cast<double>(disk.reading.time) / kSecondsPerDay, wear.percent);
-}
-
-// Extrapolates the figure that the daily run stored, provided it grew by at least `leastGrowth`
-// percent over the days of the page.
-std::optional<double> daysLeftByTrend(const PageScene& scene, const Disk& disk, const Wear& wear,
-                                      std::int64_t leastGrowth) {
-  const auto known = scene.recorded.scalars.find(
-      format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
-  if (known == scene.recorded.scalars.end() || known->second.days.size() < 2) return std::nullopt;
-  if (!isOfOneDrive(known->second.days, disk, wear)) return std::nullopt;
-  const auto& [firstDay, first] = known->second.days.front();
-  const auto& [lastDay, last] = known->second.days.back();
-  const double growth = static_cast<double>(last) - static_cast<double>(first);
-  if (growth < static_cast<double>(leastGrowth)) return std::nullopt;
-  return daysLeft(growth, static_cast<double>(lastDay) - firstDay,
-                  static_cast<double>(wear.percent));
+  for (const auto& [day, percent] : known->second.days)
+    follow(day, percent, true);
+  follow(static_cast<double>(disk.reading.time) / kSecondsPerDay, wear.percent, false);
+  return trend;
 }
 
 std::string yearsText(double days) {
@@ -91,14 +93,16 @@ std::string lifetimeText(const PageScene& scene, const Disk& disk) {
   const auto wear = wearOf(disk);
   if (!wear) return "Not known: the drive reports no wear";
   if (wear->percent >= 100) return "Its rated life is used up";
-  const auto byTrend = [&](std::int64_t leastGrowth) -> std::optional<std::string> {
-    const auto days = daysLeftByTrend(scene, disk, *wear, leastGrowth);
+  const Trend trend = trendOf(scene, disk, *wear);
+  const auto byTrend = [&](double leastGrowth) -> std::optional<std::string> {
+    if (trend.growth < leastGrowth) return std::nullopt;
+    const auto days = daysLeft(trend.growth, trend.inDays, static_cast<double>(wear->percent));
     if (!days) return std::nullopt;
     return format("About %s at the pace of the days on this page", yearsText(*days));
   };
   // The recent pace is a better guide than that of the whole life, unless it is only a step
   // or two of a whole percent.
-  constexpr std::int64_t kClearGrowth = 3;
+  constexpr double kClearGrowth = 3;
   if (const auto text = byTrend(kClearGrowth)) return *text;
   constexpr double kHoursPerDay = 24;
   if (const auto hours = figureOf(disk, "power_on_hours"); hours && wear->figure == "used_pct") {
@@ -108,8 +112,9 @@ std::string lifetimeText(const PageScene& scene, const Disk& disk) {
       return format("About %s of operation at the pace of its life so far", yearsText(*left));
   }
   if (const auto text = byTrend(1)) return *text;
-  return wear->percent == 0 ? "Not known yet: no wear so far"
-                            : "Not known yet: its wear has not changed on these days";
+  if (wear->percent == 0) return "Not known yet: no wear so far";
+  return trend.isReplacement ? "Not known yet: it has replaced another drive on these days"
+                             : "Not known yet: its wear has not changed on these days";
 }
 
 std::string valueText(Unit unit, std::int64_t value) {

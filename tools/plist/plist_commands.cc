@@ -64,7 +64,8 @@ void addPlistCommands(Command app, ToolContext& context) {
     command
         .addOption("FILE", arguments->file,
                    "Property list of either encoding, or JSON; - is standard input")
-        .required();
+        .required()
+        .notEmpty();
   };
 
   const Command showCommand = group.addCommand("show", "Print a property list for people");

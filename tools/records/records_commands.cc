@@ -12,7 +12,6 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
-#include "base/parse_number.h"
 #include "base/quantity_text.h"
 #include "base/text.h"
 #include "platform/linux/files/device_root.h"
@@ -228,12 +227,7 @@ void addSelectionOptions(Command command, Arguments& arguments) {
   command
       .addOption("--type", arguments.type,
                  "Only records of this type: 172 for ECC events, 176 for telemetry and defects")
-      .typeName("N")
-      .check([](const std::string& text) {
-        return parseNumber<std::uint32_t>(text)
-                   ? ""
-                   : format("not a type of records: %s: give a number such as 172", text);
-      });
+      .typeName("N");
   command
       .addOption("--day", arguments.day,
                  "Only records of this day: today, yesterday, a day number or YYYY-MM-DD, UTC")

@@ -8,6 +8,8 @@
 #include <utility>
 #include <vector>
 
+#include "base/parse_number.h"
+
 namespace tavrel {
 namespace {
 
@@ -76,7 +78,14 @@ Option Command::addOption(const char* names, Target& target, const char* descrip
   CLI::Option* const option = app_->add_option(names, target, description);
   constexpr bool isInteger =
       std::is_same_v<Target, std::uint32_t> || std::is_same_v<Target, std::optional<std::uint32_t>>;
-  if constexpr (isInteger) option->transform(withoutLeadingZeros);
+  if constexpr (isInteger) {
+    option->transform(withoutLeadingZeros);
+    option->check([](const std::string& text) {
+      const bool isNumber = text.empty() || parseNumber<std::uint32_t>(text);
+      return isNumber ? std::string()
+                      : "give a number up to 4294967295, in decimal digits, not " + text;
+    });
+  }
   if (names[0] != '-') return Option(*option);
   // Each use of the option takes one value; whatever follows is an argument.
   option->allow_extra_args(false);

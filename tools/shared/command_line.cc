@@ -25,9 +25,24 @@ std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   return format("%s: see '%s --help'", fault, line);
 }
 
+// The first option that ends in "=": CLI11 would take the next argument as its value.
+std::string emptyValueIn(const std::vector<std::string>& arguments) {
+  for (const std::string& argument : arguments) {
+    if (argument == "--") break;
+    const std::size_t equals = argument.find('=');
+    if (argument.starts_with('-') && equals > 1 && equals + 1 == argument.size())
+      return argument.substr(0, equals);
+  }
+  return {};
+}
+
 }  // namespace
 
 void runCommandLine(CLI::App& app, const std::vector<std::string>& arguments, ToolOutput& output) {
+  if (const std::string option = emptyValueIn(arguments); !option.empty()) {
+    return output.failUsage(
+        format("%s: must not be empty: see '%s --help'", option, app.get_name()));
+  }
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));
   } catch (const CLI::ParseError& error) {

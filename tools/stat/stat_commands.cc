@@ -64,11 +64,6 @@ std::string periodFault(const std::string& text) {
   return format("not a number of seconds: %s: give 1 or more", text);
 }
 
-std::string secondsFault(const std::string& text) {
-  if (parseNumber<std::uint32_t>(text)) return {};
-  return format("not a number of seconds: %s: give 0 or more", text);
-}
-
 void addKey(Command command, Arguments& arguments) {
   command.addOption("KEY", arguments.key, "Name of the statistic").required();
 }
@@ -92,8 +87,10 @@ void addStatCommands(Command app, ToolContext& context) {
       "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
       arguments, context,
       [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
-  import.addOption("FILE", arguments->file,
-                   "Lines to import, all or none; - is standard input (default)");
+  import
+      .addOption("FILE", arguments->file,
+                 "Lines to import, all or none; - is standard input (default)")
+      .notEmpty();
   import.setFooter(
       "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar "
       "replaces\nthe one of its day. Values are added to those of their day: importing a file "
@@ -151,8 +148,7 @@ void addStatCommands(Command app, ToolContext& context) {
       });
   const Option seconds =
       collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
-          .typeName("N")
-          .check(secondsFault);
+          .typeName("N");
   const Option once =
       collected
           .addFlag("--once", arguments->once,

@@ -24,7 +24,7 @@ const char* adviceFor(int code, bool writes) {
     case SQLITE_FULL:
       return "free some space in its file system";
     case SQLITE_READONLY:
-      if (!writes) return "readers must be able to write in its folder too; or query a copy";
+      if (!writes) return "make its folder writable for readers, or query a copy";
       [[fallthrough]];
     case SQLITE_CANTOPEN:
     case SQLITE_PERM:
