@@ -3,6 +3,8 @@
 #include <bit>
 #include <random>
 
+#include "base/bytes.h"
+
 namespace tavrel {
 namespace {
 
@@ -42,10 +44,10 @@ struct SipState {
 };
 
 // Little-endian on every machine: the length of the text goes into the last word's highest byte.
-std::uint64_t wordAt(const char* at, std::size_t length) {
+std::uint64_t lastWord(std::string_view rest) {
   std::uint64_t word = 0;
-  for (std::size_t i = 0; i < length; ++i)
-    word |= std::uint64_t{static_cast<unsigned char>(at[i])} << (8 * i);
+  for (std::size_t i = 0; i < rest.size(); ++i)
+    word |= std::uint64_t{static_cast<unsigned char>(rest[i])} << (8 * i);
   return word;
 }
 
@@ -56,8 +58,8 @@ std::uint64_t sipHash(std::string_view text, const HashKey& key) {
                  0x6C7967656E657261 ^ key.low, 0x7465646279746573 ^ key.high};
   std::size_t at = 0;
   for (; text.size() - at >= 8; at += 8)
-    state.absorb(wordAt(text.data() + at, 8));
-  state.absorb(std::uint64_t{text.size()} << 56 | wordAt(text.data() + at, text.size() - at));
+    state.absorb(*loadLittle64(asBytes(text), at));
+  state.absorb(std::uint64_t{text.size()} << 56 | lastWord(text.substr(at)));
   state.v2 ^= 0xFF;
   for (int i = 0; i < 3; ++i)
     state.round();

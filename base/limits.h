@@ -1,6 +1,5 @@
 // Every limit on data from outside, with its unit and its reason. The code that drops or refuses
-// something because of a limit reports it, except
-// where it is said here.
+// something because of a limit reports it, unless the limit's comment says otherwise.
 #pragma once
 
 #include <cstddef>

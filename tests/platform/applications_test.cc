@@ -83,8 +83,9 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   std::sort(found.begin(), found.end());
   EXPECT_EQ(found, (Lines{prefix + "deep.desktop System", "editor.desktop System",
                           "kde-mail.desktop User", "tool.desktop User"}));
-  EXPECT_EQ(log.lines, Lines{"desktop entries below more than 16 folders do not count, as in " +
-                             root.path(path + "/d")});
+  EXPECT_EQ(log.lines,
+            Lines{"desktop entries nested more than 16 folders deep do not count, as in " +
+                  root.path(path + "/d") + "; move them up"});
 }
 
 TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {

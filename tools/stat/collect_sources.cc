@@ -153,7 +153,7 @@ bool MachineSources::isDisk(std::string_view name) {
   std::string entry(name);
   std::ranges::replace(entry, '/', '!');
   const bool is =
-      !isVirtualDisk(name) && live::isDiskDevice(root_.pathOrMachine("/sys/block/" + entry));
+      !isVirtualDisk(name) && live::isOwnDevice(root_.pathOrMachine("/sys/block/" + entry));
   disks_.emplace(name, is);
   return is;
 }

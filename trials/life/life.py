@@ -218,7 +218,7 @@ class Life:
             expect("Day unchanged since last run" in done.err, f"a run took place: {done.err}")
         else:
             passed = [each.split(" info ", 1)[1] for each in done.err.splitlines()
-                      if "will not be reported" in each]
+                      if " had no daily run, " in each]
             line = effects["line"]
             expect(passed == ([line] if line else []), f"{passed} and not {line}")
             self.check_effects(effects)

@@ -115,8 +115,10 @@ class Enumeration {
   bool isTooDeep(const std::string& path, int depth) {
     if (depth < limits::kDesktopFolderDepth) return false;
     if (!std::exchange(isDepthTold_, true)) {
-      log_.log(LogLevel::Error, "desktop entries below more than %d folders do not count, as in %s",
-               limits::kDesktopFolderDepth, path);
+      log_.log(
+          LogLevel::Error,
+          "desktop entries nested more than %d folders deep do not count, as in %s; move them up",
+          limits::kDesktopFolderDepth, path);
     }
     return true;
   }

@@ -76,7 +76,7 @@ SystemControls::Result give(std::string_view event, MutableByteSpan buffer) {
 SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
   if (buffer.size() < kEccEventBytes) return {ENOMEM, 0};
   if (!unfiled_.empty() || handedOut_ == kEccEventsOfARun) return endRun(EBUSY);
-  if (queue_.empty()) fill();
+  if (queue_.empty() && !fill()) return endRun(EBUSY);
   if (mode_ == Mode::Consume && !queue_.empty() && !lockQueue()) return endRun(EBUSY);
   while (!queue_.empty()) {
     const Event event = std::move(queue_.back());
@@ -144,17 +144,20 @@ bool EccEvents::lockQueue() {
   return true;
 }
 
-void EccEvents::fill() {
+bool EccEvents::fill() {
   const bool isPeek = mode_ == Mode::Peek;
-  if (std::exchange(hasLooked_, true) && isPeek) return;
+  if (std::exchange(hasLooked_, true) && isPeek) return true;
   if (isPeek) {
     plist::Dictionary counted = seenErrors();
     queue_ = newErrors(counted);
-  } else {
-    publishCountedErrors();
+  } else if (!publishCountedErrors()) {
+    return false;
   }
   const auto names = files_.list(root_.path(kFolder));
-  if (!names) return log_.write(LogLevel::Error, names.error().message);
+  if (!names) {
+    log_.write(LogLevel::Error, names.error().message);
+    return true;
+  }
   for (const std::string& name : *names) {
     if (name.ends_with(kEventEnding) || name.ends_with(kErrorEnding)) queue_.push_back({name, {}});
   }
@@ -163,6 +166,7 @@ void EccEvents::fill() {
   // An event published again has the same name as in the run that was cut off.
   const auto isSame = [](const Event& a, const Event& b) { return a.name == b.name; };
   queue_.erase(std::unique(queue_.begin(), queue_.end(), isSame), queue_.end());
+  return true;
 }
 
 plist::Dictionary EccEvents::seenErrors() {
@@ -170,27 +174,28 @@ plist::Dictionary EccEvents::seenErrors() {
   return seen ? seen : plist::Dictionary::create();
 }
 
-void EccEvents::publishCountedErrors() {
+bool EccEvents::publishCountedErrors() {
   plist::Dictionary counted = seenErrors();
   const plist::Value before = mutableCopy(counted);
   const std::vector<Event> events = newErrors(counted);
-  if (before == plist::Value(counted)) return;
+  if (before == plist::Value(counted)) return true;
   if (!folderLock_) {
     // Another process may publish the same errors until the folder is locked.
     if (Status made = files_.makeFolders(root_.path(kFolder)); !made) {
-      return log_.write(LogLevel::Error, made.error().message);
+      log_.write(LogLevel::Error, made.error().message);
+      return true;
     }
-    if (lockQueue()) publishCountedErrors();
-    return;
+    return lockQueue() && publishCountedErrors();
   }
   const Status published = publish(events, counted);
-  if (published) return;
+  if (published) return true;
   log_.write(LogLevel::Error, published.error().message);
   // Without stored counts, the next look would publish these errors again. The counts may be in
   // place although they could not be flushed.
-  if (before != plist::Value(seenErrors())) return;
+  if (before != plist::Value(seenErrors())) return true;
   for (const Event& event : events)
     files_.discard(root_.path(kFolder) + '/' + event.name);
+  return true;
 }
 
 // Events first: a run that is cut off in between publishes them twice instead of never.

@@ -65,14 +65,15 @@ class EccEvents {
   SystemControls::Result endRun(int errorNumber);
   /// Locks the folder for the rest of the run; false, and a line, when that fails.
   bool lockQueue();
-  void fill();
+  /// False when the queue cannot be locked to publish new errors.
+  bool fill();
   /// Renames an unusable file out of the way; when peeking, only logs that it would.
   void setAside(const std::string& path, std::string_view fault);
   /// The counts at the last look; for a controller that is gone, the last known ones.
   plist::Dictionary seenErrors();
   /// Writes events for the errors counted since the last look, and remembers the counts. Writes no
   /// event when the counts cannot be stored.
-  void publishCountedErrors();
+  bool publishCountedErrors();
   Status publish(const std::vector<Event>& events, const plist::Dictionary& counted);
   /// The events for errors beyond `counted`, which is updated.
   std::vector<Event> newErrors(plist::Dictionary& counted);

@@ -13,10 +13,11 @@
 namespace tavrel {
 namespace {
 
-/// For reading. Without /proc it fails with ENOTSUP.
+/// For reading. Without /proc it fails with ENOTSUP. Never waits: a user may hold a lease on the
+/// file, and some regular files of the kernel block readers.
 Descriptor reopen(const Descriptor& found) {
   const std::string path = "/proc/self/fd/" + std::to_string(found.get());
-  Descriptor descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+  Descriptor descriptor(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));
   if (!descriptor && errno == ENOENT) errno = ENOTSUP;
   return descriptor;
 }

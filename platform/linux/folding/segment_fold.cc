@@ -229,10 +229,14 @@ bool FoldRun::mustWait(const SegmentName& name) {
         "until days are reported and removed; see 'tavrelctl limits'");
     return true;
   }
-  std::uint64_t& ofUser = values_[name.owner];
-  if (ofUser >= limits::kFoldValuesPerUser ||
-      report_.values + counts_.values >= limits::kFoldValues) {
+  if (values_[name.owner] >= limits::kFoldValuesPerUser) {
     tellOfLimit(name.owner, kManyValues);
+    return true;
+  }
+  if (report_.values + counts_.values >= limits::kFoldValues) {
+    notes_.tell(
+        "segments wait: the fold has taken as many measurements of all users as it may; fold more "
+        "often");
     return true;
   }
   if (known_->contains(name) || ++positions_[name.owner] <= limits::kSegmentsPerUser) return false;

@@ -181,6 +181,7 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
   KeptUse left = use();
   std::vector<std::string> companions;
   bool dayStays = false;
+  std::int64_t stuckBytes = 0;
   for (std::size_t i = 0; i < list_.size() && !stays(i); ++i) {
     if (left.days <= bounds.days && left.bytes <= bounds.bytes) break;
     const KeptFile& file = list_[i];
@@ -191,8 +192,10 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
       left.bytes -= file.bytes;
       if (!file.companion.empty()) companions.push_back(file.companion);
     } else {
-      dayStays = true;
       if (trimmed.status) trimmed.status = removed;
+      // Removing all others would not bring them within the bound.
+      if (stuckBytes += file.bytes; stuckBytes > bounds.bytes) break;
+      dayStays = true;
     }
     // Files of one day are adjacent, so a day has gone once the next file is of another day.
     const bool isLastOfDay = i + 1 == list_.size() || list_[i + 1].day() != file.day();

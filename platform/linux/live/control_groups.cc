@@ -53,6 +53,7 @@ constexpr std::array kIo{
 using DiskNumbers = std::set<std::string, std::less<>>;  // "8:0"
 
 // The disks that are devices. Mappings and loops pass their I/O on to these, where it counts again.
+// Unlike `isOwnDevice`, this includes NVMe disks with several paths: paths have no number.
 DiskNumbers deviceNumbers(const DeviceRoot& root) {
   DiskNumbers numbers;
   for (const std::string& name : namesIn(root.path("/sys/block"))) {

@@ -121,7 +121,7 @@ std::string linkedName(const std::string& path) {
   return std::string(text.substr(text.rfind('/') + 1));
 }
 
-bool isDiskDevice(const std::string& folder) {
+bool isOwnDevice(const std::string& folder) {
   const std::string device = folder + "/device";
   return exists(device) && !linkedName(device).starts_with("nvme-subsys");
 }

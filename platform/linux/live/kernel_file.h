@@ -76,8 +76,8 @@ bool exists(const std::string& path);
 bool isFolder(const std::string& path);
 /// The last part of the link's target; empty when it is not a link.
 std::string linkedName(const std::string& path);
-/// Whether a disk, given its folder in sysfs, is a device of its own. A disk that NVMe makes of
-/// several paths is not: the paths are, each with a disk that counts.
-bool isDiskDevice(const std::string& folder);
+/// Whether a disk or interface, given its folder in sysfs, is a device of its own. A disk that NVMe
+/// makes of several paths is not: the paths are, each with a disk that counts.
+bool isOwnDevice(const std::string& folder);
 
 }  // namespace tavrel::live

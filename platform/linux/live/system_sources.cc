@@ -100,7 +100,8 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
   TextBuffer buffer;
   auto text = readKernelFile(root.path("/proc/self/mounts"), ReadMode::ToEnd, buffer);
   std::unordered_set<std::string> seen;
-  while (text && !text->empty() && seen.size() < limits::kLiveDevices) {
+  bool isCut = buffer.isCut();
+  while (text && !text->empty()) {
     std::string_view line = takeLine(*text);
     const auto takeField = [&] {
       const std::string_view field = line.substr(0, line.find(' '));
@@ -112,7 +113,10 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
     const bool isRoot = mountPoint == "/";
     const bool isOnDisk = isLocal(device, takeField());
     if (!isRoot && !isOnDisk) continue;
-    if (!seen.insert(device).second) continue;
+    if (seen.contains(device)) continue;
+    isCut = isCut || seen.size() == limits::kLiveDevices;
+    if (seen.size() == limits::kLiveDevices) break;
+    seen.insert(device);
     const std::string name = isOnDisk ? channelName(device.substr(device.rfind('/') + 1)) : "root";
     const std::uint32_t first = source.addMeasured(
         kFileSystemSlots,
@@ -132,7 +136,7 @@ void addFileSystems(const DeviceRoot& root, LiveSource& source) {
                        first + static_cast<std::uint32_t>(kUsedPercent));
     }
   }
-  if (text && !text->empty()) {
+  if (isCut) {
     source.note(format("only the first %zu mounted file systems are shown", seen.size()));
   }
 }

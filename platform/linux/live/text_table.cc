@@ -142,7 +142,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
     const std::string device = channelName(row.key);
     const bool isDaily =
         !table.daily.empty() &&
-        isDiskDevice(root.path(std::string(table.daily) + '/' + entryName(row.key)));
+        isOwnDevice(root.path(std::string(table.daily) + '/' + entryName(row.key)));
     for (const Column& column : table.columns) {
       const std::uint32_t at = slot++;
       // Older kernels have fewer columns.
