@@ -1,4 +1,6 @@
 
+#include <csignal>
+#include <fcntl.h>
 #include <sys/inotify.h>
 
 #include "device_services.h"
@@ -109,6 +111,13 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(bundles(), Lines{"tool.desktop System"});
   EXPECT_EQ(log.lines.back(),
             "cannot read " + packages + ": Invalid argument; desktop entries are counted instead");
+
+  // A user who ignores the request to give up a lease keeps nobody waiting.
+  const std::string tool = root.path("/usr/share/applications/tool.desktop");
+  const Descriptor held(open(tool.c_str(), O_WRONLY | O_CLOEXEC));
+  ASSERT_NE(signal(SIGIO, SIG_IGN), SIG_ERR);
+  ASSERT_EQ(fcntl(held.get(), F_SETLEASE, F_WRLCK), 0);
+  EXPECT_EQ(bundles(), Lines{}) << "waiting ends the lease after 45 seconds";
 }
 
 }  // namespace
