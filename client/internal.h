@@ -44,9 +44,18 @@ void bhDrop(struct Process* process, struct Segment* segment);
 
 /* segment_file.c */
 
+/* What the name of a segment's file is made of. */
+struct SegmentName {
+  uint64_t time; /* CLOCK_MONOTONIC, nanoseconds */
+  uint64_t thread;
+};
+
 /* Creates and maps a new segment and fills in its header; NULL with `status` on failure. */
-struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status);
-void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment);
+struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
+                               BHClientStatus* status);
+void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segment* segment);
+/* Whether the segment's file, or its folder, has been removed. */
+bool bhWasRemoved(const char* folder, struct SegmentName name);
 /* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);

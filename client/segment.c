@@ -26,9 +26,9 @@ void bhForgetInterrupted(struct Process* process, const struct Segment* segment)
 
 static struct Segment* begin(struct Process* process, uint64_t now) {
   struct State* state = process->state;
-  char name[64];
+  struct SegmentName name;
   BHClientStatus status = BHClientStatusFailed;
-  struct Segment* begun = bhBeginSegment(process->folder, name, &status);
+  struct Segment* begun = bhBeginSegment(process->folder, &name, &status);
   if (!begun) {
     atomic_store_explicit(&state->status, status, memory_order_relaxed);
     atomic_store_explicit(&state->retryAt, now + kRetrySeconds, memory_order_relaxed);
@@ -40,6 +40,8 @@ static struct Segment* begin(struct Process* process, uint64_t now) {
   if (atomic_compare_exchange_strong_explicit(&state->segment, &known, begun, memory_order_acq_rel,
                                               memory_order_acquire)) {
     atomic_store(&process->mapped, begun);
+    atomic_store_explicit(&state->nameTime, name.time, memory_order_relaxed);
+    atomic_store_explicit(&state->nameThread, name.thread, memory_order_release);
     return begun;
   }
   bhAbandonSegment(process->folder, name, begun);
@@ -103,12 +105,23 @@ static const char* textOf(BHClientStatus status) {
       return "the system failed to create a file in /run/tavrel/stat: nothing is recorded";
     case BHClientStatusFull:
       return "the segment is full: values are dropped until a fold makes room";
+    case BHClientStatusRemoved:
+      return "the process's file in /run/tavrel/stat has been removed: values are lost until the "
+             "process is restarted";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
              "bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or 256 KiB of "
              "names that a process may have";
   }
   return "unknown status";
+}
+
+/* Threads keep pointers into the segment, so that no other can take its place. */
+static bool isRemoved(const struct Process* process) {
+  struct State* state = process->state;
+  const uint64_t thread = atomic_load_explicit(&state->nameThread, memory_order_acquire);
+  const uint64_t time = atomic_load_explicit(&state->nameTime, memory_order_relaxed);
+  return thread != 0 && bhWasRemoved(process->folder, (struct SegmentName){time, thread});
 }
 
 static BHClientStatus currentStatus(void) {
@@ -118,6 +131,7 @@ static BHClientStatus currentStatus(void) {
   if (!bhSegment(process)) {
     return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
   }
+  if (isRemoved(process)) return BHClientStatusRemoved;
   if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
   return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
 }

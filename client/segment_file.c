@@ -1,5 +1,6 @@
 #include <fcntl.h>
 #include <linux/magic.h>
+#include <pthread.h>
 #include <string.h>
 #include <sys/mman.h>
 #include <sys/resource.h>
@@ -50,14 +51,21 @@ static char* appendHex(char* to, uint64_t number) {
   return to;
 }
 
-/* "<time>-<thread>.segment" */
-static void makeName(char name[64], unsigned attempt) {
+static struct SegmentName makeName(unsigned attempt) {
   struct timespec now = {0};
   clock_gettime(CLOCK_MONOTONIC, &now);
-  name = appendHex(name, (uint64_t)now.tv_sec * 1000000000U + (uint64_t)now.tv_nsec + attempt);
-  *name++ = '-';
-  name = appendHex(name, (uint64_t)syscall(SYS_gettid));
-  memcpy(name, ".segment", sizeof ".segment");
+  return (struct SegmentName){
+      (uint64_t)now.tv_sec * 1000000000U + (uint64_t)now.tv_nsec + attempt,
+      (uint64_t)syscall(SYS_gettid),
+  };
+}
+
+/* "<time>-<thread>.segment" */
+static void writeName(char to[64], struct SegmentName name) {
+  to = appendHex(to, name.time);
+  *to++ = '-';
+  to = appendHex(to, name.thread);
+  memcpy(to, ".segment", sizeof ".segment");
 }
 
 void bhForgetMapping(struct Segment* segment) {
@@ -84,6 +92,16 @@ static bool mayMakeFilesThatLarge(void) {
   return getrlimit(RLIMIT_FSIZE, &limit) != 0 || limit.rlim_cur >= kBHSegmentBytes;
 }
 
+/* The C library's function, unlike syscall(), passes 64-bit lengths correctly on 32-bit machines.
+ * It is a cancellation point, but not while cancellation is off. */
+static bool allocateFile(int file) {
+  int before;
+  pthread_setcancelstate(PTHREAD_CANCEL_DISABLE, &before);
+  const bool isDone = fallocate(file, 0, 0, kBHSegmentBytes) == 0;
+  pthread_setcancelstate(before, NULL);
+  return isDone;
+}
+
 static struct Segment* mapSegment(int file) {
   if (!mayMakeFilesThatLarge()) {
     errno = EFBIG;
@@ -96,9 +114,7 @@ static struct Segment* mapSegment(int file) {
 
   bool isThere = madvise(segment, kBHKeyTable, MADV_POPULATE_WRITE) == 0;
   /* Before Linux 5.14, memory can be allocated only through the file, so allocate all of it now. */
-  if (!isThere && errno == EINVAL) {
-    isThere = syscall(SYS_fallocate, file, 0, (off_t)0, (off_t)kBHSegmentBytes) == 0;
-  }
+  if (!isThere && errno == EINVAL) isThere = allocateFile(file);
   if (!isThere) {
     const int error = errno;
     munmap(segment, kBHSegmentBytes);
@@ -117,10 +133,12 @@ bool bhFetch(const void* from, size_t bytes) {
   return result == 0 || errno == EINVAL;
 }
 
-static struct Segment* beginIn(int directory, char name[64], BHClientStatus* status) {
+static struct Segment* beginIn(int directory, struct SegmentName* made, BHClientStatus* status) {
+  char name[64];
   int file = -1;
   for (unsigned attempt = 0; attempt < kNameAttempts; ++attempt) {
-    makeName(name, attempt);
+    *made = makeName(attempt);
+    writeName(name, *made);
     file = openFile(directory, name, O_RDWR | O_CREAT | O_EXCL | O_NOFOLLOW, 0600);
     if (file >= 0 || errno != EEXIST) break;
   }
@@ -140,7 +158,8 @@ static struct Segment* beginIn(int directory, char name[64], BHClientStatus* sta
   return segment;
 }
 
-struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus* status) {
+struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
+                               BHClientStatus* status) {
   const int directory = openFolder(folder);
   if (directory < 0) {
     *status = statusOf(errno);
@@ -162,10 +181,23 @@ struct Segment* bhBeginSegment(const char* folder, char name[64], BHClientStatus
   return segment;
 }
 
-void bhAbandonSegment(const char* folder, const char* name, struct Segment* segment) {
+void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segment* segment) {
   munmap(segment, kBHSegmentBytes);
   const int directory = openFolder(folder);
   if (directory < 0) return;
-  unlinkat(directory, name, 0);
+  char file[64];
+  writeName(file, name);
+  unlinkat(directory, file, 0);
   closeFile(directory);
+}
+
+bool bhWasRemoved(const char* folder, struct SegmentName name) {
+  const int directory = openFolder(folder);
+  if (directory < 0) return errno == ENOENT;
+  char file[64];
+  writeName(file, name);
+  struct stat entry;
+  const bool isGone = fstatat(directory, file, &entry, AT_SYMLINK_NOFOLLOW) != 0 && errno == ENOENT;
+  closeFile(directory);
+  return isGone;
 }

@@ -75,6 +75,7 @@ class Status(enum.IntEnum):
     FAILED = 7
     FULL = 8
     KEY_REFUSED = 9
+    REMOVED = 10
 
 
 def status() -> tuple[Status, str]:

@@ -310,6 +310,35 @@ TEST_F(Recording, AThreadMayStillRecordIntoAChunkThatIsEmptyAgain) {
   expectEachOnce(records["series"], kCount, 0);
 }
 
+TEST_F(Recording, OnAnOldKernelTheWholeFileIsAllocatedAtOnce) {
+  run([] {
+    isOldKernel = true;
+    record(1);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
+  });
+  struct stat file;
+  ASSERT_EQ(stat((folder / segments().at(0)).c_str(), &file), 0);
+  EXPECT_EQ(file.st_blocks * 512, kBHSegmentBytes);
+  fold();
+  EXPECT_EQ(records["series"], (std::vector<double>{1}));
+}
+
+TEST_F(Recording, SaysWhenItsFileIsGone) {
+  for (const auto& removed : {folder / "*", std::filesystem::path(root)}) {
+    run([=, this] {
+      record(1);
+      EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
+      outputOf("rm -r " + removed.string(), 0);
+      const char* text = nullptr;
+      EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusRemoved);
+      EXPECT_STREQ(text,
+                   "the process's file in /run/tavrel/stat has been removed: values are lost until "
+                   "the process is restarted");
+      run([] { EXPECT_NE(BHClientGetStatus(nullptr), BHClientStatusRemoved); });
+    });
+  }
+}
+
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {
   if (mount("test", folder.c_str(), "tmpfs", 0, "size=128k") != 0) GTEST_SKIP() << "not root";
   for (const bool isLarge : {false, true}) {

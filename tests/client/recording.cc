@@ -22,7 +22,9 @@ void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file
 
 int __wrap_madvise(void* from, std::size_t bytes, int advice) {
   if (tavrel::whileFetching) tavrel::whileFetching();
-  if (tavrel::largePages && reinterpret_cast<std::uintptr_t>(from) % kLargePage != 0) {
+  constexpr int kPopulateWrite = 23;
+  if ((tavrel::largePages && reinterpret_cast<std::uintptr_t>(from) % kLargePage != 0) ||
+      (tavrel::isOldKernel && advice == kPopulateWrite)) {
     errno = EINVAL;
     return -1;
   }
@@ -64,6 +66,7 @@ namespace tavrel {
 
 std::function<void()> whileFetching;
 bool largePages = false;
+bool isOldKernel = false;
 
 TestClock& testClock() {
   static TestClock& clock = shared<TestClock>();

@@ -43,6 +43,8 @@ extern std::function<void()> whileFetching;
 
 /// Whether the kernel seems to have pages of 16 KiB.
 extern bool largePages;
+/// Whether the kernel seems to be older than Linux 5.14.
+extern bool isOldKernel;
 
 /// Memory shared with children: they see changes.
 template <class T>

@@ -75,6 +75,7 @@ print("starts", log["BHScalars"]["com.example.starts"])
 print("seconds", log["BHDistributions"]["com.example.seconds"])
 print("seconds", log["BHDistributionsHistogram"]["com.example.seconds"])')"
 expect "nothing waits" "" "$(logs pending)$(logs outbox)"
+expect "others see the outbox" 755 "$(stat -c %a /var/mobile/Library/Logs/Submission/outbox)"
 record 3
 clock '2037-11-23 00:07'
 expect "the next day's log is filed" log-tallied "$(logs pending)"

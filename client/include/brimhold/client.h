@@ -93,7 +93,8 @@ typedef enum BHClientStatus {
   BHClientStatusUnsupported = 6, /* the kernel lacks what the library needs (Linux 4.14) */
   BHClientStatusFailed = 7,      /* the system failed for another reason */
   BHClientStatusFull = 8,        /* values are dropped until a fold makes room */
-  BHClientStatusKeyRefused = 9   /* values are kept, but a look-up was refused */
+  BHClientStatusKeyRefused = 9,  /* values are kept, but a look-up was refused */
+  BHClientStatusRemoved = 10     /* the file that takes the values has been removed */
 } BHClientStatus;
 
 /* Says whether values recorded now are kept, and if not, why. Starts recording if necessary.
