@@ -1,6 +1,5 @@
 #include <algorithm>
 #include <cmath>
-#include <utility>
 
 #include "base/format.h"
 #include "page/charts.h"

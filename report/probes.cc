@@ -1,6 +1,5 @@
 // The probes of the report: the daemon's own measurements when a log is serialised.
 #include <array>
-#include <optional>
 #include <string>
 #include <vector>
 

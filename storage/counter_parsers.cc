@@ -36,12 +36,11 @@ template <CounterRange kRange>
 void copyRange(CounterBlock block, TelemetryCounters& record) {
   constexpr std::size_t kCount = kRange.last - kRange.first + 1;
   std::uint32_t* const to = &record.elements[shapeOf(kRange.array).first + kRange.first];
-  const std::byte* const from = &block[kRange.firstWord * kWordBytes];
   if constexpr (std::endian::native == std::endian::little) {
-    std::memcpy(to, from, kCount * kWordBytes);
+    std::memcpy(to, &block[kRange.firstWord * kWordBytes], kCount * kWordBytes);
   } else {
     for (std::size_t i = 0; i < kCount; ++i)
-      to[i] = bytes_detail::assembleLittle<std::uint32_t>(from + i * kWordBytes);
+      to[i] = loadLittle32(block, (kRange.firstWord + i) * kWordBytes).value_or(0);
   }
 }
 

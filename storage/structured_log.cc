@@ -44,8 +44,9 @@ WriteAmplification amplificationIn(const ASPContext& context) {
     if (name == "intermediateBandErases") intermediateErases = entry.value;
   });
   const auto hostWrites = static_cast<double>(context.hostWrites);
-  const std::uint64_t blockUnits =
-      (context.pagesPerVirtualBlock * context.bytesPerPage) >> kUnitShift;
+  // Receivers expect the size modulo 2^32.
+  const std::uint32_t blockBytes = context.pagesPerVirtualBlock * context.bytesPerPage;
+  const std::uint64_t blockUnits = blockBytes >> kUnitShift;
   const std::uint64_t slcUnits = (slcPages * context.bytesPerPage) >> kUnitShift;
 
   WriteAmplification result;

@@ -2,10 +2,10 @@
 
 #include <algorithm>
 #include <charconv>
-#include <cstring>
 #include <iterator>
 #include <memory>
 
+#include "base/bytes.h"
 #include "storage/parse/statistic_keys.h"
 
 namespace tavrel {
@@ -16,7 +16,7 @@ constexpr std::uint32_t kLargestValidKey = 0x30000000;
 constexpr std::uint32_t kReadCountHistoKey = 265;
 
 std::uint64_t unitAt(ByteSpan units, std::size_t index) {
-  return bytes_detail::assembleLittle<std::uint64_t>(&units[index * kUnitBytes]);
+  return loadLittle64(units, index * kUnitBytes).value_or(0);
 }
 
 // The fields that other parts of the system read without searching the lists.

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <functional>
 #include <iterator>
-#include <optional>
 #include <string>
 #include <sys/statvfs.h>
 #include <time.h>
