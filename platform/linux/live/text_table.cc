@@ -4,6 +4,7 @@
 #include <memory>
 #include <tuple>
 #include <unordered_set>
+#include <utility>
 
 #include "base/format.h"
 #include "base/limits.h"
@@ -47,6 +48,70 @@ void publish(const Place& place, std::string name, std::uint32_t slot, const Dai
              LiveSource& source) {
   source.addSimple(place, std::move(name), slot, daily.isItself ? kDailyCategory : kToolCategory);
   if (!daily.fold.empty()) source.addToFold(daily.fold, place.unit, daily.how, slot);
+}
+
+struct DeviceRow {
+  std::string key;
+  std::size_t tokens;
+};
+
+struct DeviceRows {
+  std::vector<DeviceRow> rows;
+  bool isCut = false;  // whether there were more
+};
+
+/// The rows that name devices to show, each name once.
+DeviceRows deviceRows(std::string_view text, const DeviceRoot& root, const DeviceTable& table) {
+  std::unordered_set<std::string> allowed;
+  if (!table.only.empty()) {
+    for (std::string& name : namesIn(root.path(table.only)))
+      allowed.insert(std::move(name));
+  }
+  DeviceRows found;
+  std::unordered_set<std::string> seen;
+  forEachRow(text, table.form, [&](std::string_view key, std::size_t tokens) {
+    if (!key.starts_with(table.prefix)) return;
+    if (found.rows.size() == limits::kLiveRows) {
+      found.isCut = true;
+      return;
+    }
+    if (!table.prefix.empty() && key == table.prefix) return;  // the sum of all
+    std::string name(key);
+    if (!table.only.empty() && !allowed.contains(entryName(name))) return;
+    if (seen.insert(name).second) found.rows.push_back({std::move(name), tokens});
+  });
+  return found;
+}
+
+/// Each row has a slot for each column.
+std::unique_ptr<TableReader> readerOf(const std::vector<DeviceRow>& rows,
+                                      const DeviceTable& table) {
+  std::vector<Cell> cells;
+  for (const Column& column : table.columns)
+    cells.push_back({column.token, static_cast<std::uint32_t>(cells.size()), column.scale});
+  const auto width = static_cast<std::uint32_t>(cells.size());
+  auto reader = std::make_unique<TableReader>(table.form, std::move(cells));
+  for (std::size_t i = 0; i < rows.size(); ++i)
+    reader->addRow(rows[i].key, static_cast<std::uint32_t>(i) * width);
+  return reader;
+}
+
+using CellKind = std::pair<std::size_t, Scale>;  // token and scale
+
+bool isBefore(const CellKind& a, const CellKind& b) {
+  return std::tuple(a.first, a.second.multiply, a.second.divide) <
+         std::tuple(b.first, b.second.multiply, b.second.divide);
+}
+
+/// Each token and scale of the figures once, in order.
+std::vector<CellKind> cellKindsOf(std::span<const Figure> figures) {
+  std::vector<CellKind> kinds;
+  for (const Figure& figure : figures)
+    kinds.emplace_back(figure.token, figure.scale);
+  std::sort(kinds.begin(), kinds.end(), isBefore);
+  const auto isSame = [](const CellKind& a, const CellKind& b) { return !isBefore(a, b); };
+  kinds.erase(std::unique(kinds.begin(), kinds.end(), isSame), kinds.end());
+  return kinds;
 }
 
 }  // namespace
@@ -104,41 +169,14 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   std::string path = root.path(table.path);
   const auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   if (!text) return;
-  std::unordered_set<std::string> allowed;
-  if (!table.only.empty()) {
-    for (std::string& name : namesIn(root.path(table.only)))
-      allowed.insert(std::move(name));
+  const DeviceRows found = deviceRows(*text, root, table);
+  if (found.isCut || buffer.isCut()) {
+    source.note(format("%s: only the first %zu rows are shown", path, found.rows.size()));
   }
-  struct Row {
-    std::string key;
-    std::size_t tokens;
-  };
-  std::vector<Row> rows;
-  std::unordered_set<std::string> seen;
-  bool isCut = buffer.isCut();
-  forEachRow(*text, table.form, [&](std::string_view key, std::size_t tokens) {
-    if (!key.starts_with(table.prefix)) return;
-    if (rows.size() == limits::kLiveRows) {
-      isCut = true;
-      return;
-    }
-    if (!table.prefix.empty() && key == table.prefix) return;  // the sum of all
-    std::string name(key);
-    if (!table.only.empty() && !allowed.contains(entryName(name))) return;
-    if (seen.insert(name).second) rows.push_back({std::move(name), tokens});
-  });
-  if (isCut) source.note(format("%s: only the first %zu rows are shown", path, rows.size()));
-  std::vector<Cell> cells;
-  for (const Column& column : table.columns)
-    cells.push_back({column.token, static_cast<std::uint32_t>(cells.size()), column.scale});
-  const auto width = static_cast<std::uint32_t>(cells.size());
-  auto reader = std::make_unique<TableReader>(table.form, std::move(cells));
-  for (std::size_t i = 0; i < rows.size(); ++i)
-    reader->addRow(rows[i].key, static_cast<std::uint32_t>(i) * width);
+  const auto slots = static_cast<std::uint32_t>(found.rows.size() * table.columns.size());
   std::uint32_t slot =
-      source.addTextFile(std::move(path), static_cast<std::uint32_t>(rows.size()) * width,
-                         std::move(reader), ReadMode::ToEnd);
-  for (const Row& row : rows) {
+      source.addTextFile(std::move(path), slots, readerOf(found.rows, table), ReadMode::ToEnd);
+  for (const DeviceRow& row : found.rows) {
     const std::string device = channelName(row.key);
     const bool isDaily =
         !table.daily.empty() &&
@@ -162,16 +200,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
   forEachRow(*text, list.form,
              [&](std::string_view key, std::size_t count) { tokens.emplace(key, count); });
   // Rows may have different figures, so the table has a column for each listed token and scale.
-  std::vector<std::pair<std::size_t, Scale>> columns;
-  for (const Figure& figure : list.figures)
-    columns.emplace_back(figure.token, figure.scale);
-  const auto before = [](const auto& a, const auto& b) {
-    return std::tuple(a.first, a.second.multiply, a.second.divide) <
-           std::tuple(b.first, b.second.multiply, b.second.divide);
-  };
-  std::sort(columns.begin(), columns.end(), before);
-  const auto same = [&](const auto& a, const auto& b) { return !before(a, b) && !before(b, a); };
-  columns.erase(std::unique(columns.begin(), columns.end(), same), columns.end());
+  const std::vector<CellKind> columns = cellKindsOf(list.figures);
   std::vector<Cell> cells;
   cells.reserve(columns.size());
   for (const auto& [token, scale] : columns)
@@ -188,7 +217,7 @@ void addFigures(const std::string& path, const FigureList& list, LiveSource& sou
         firstSlots.emplace(figure.key, static_cast<std::uint32_t>(firstSlots.size()) * width);
     if (isNew) reader->addRow(row->first, at->second);
     const auto column = std::lower_bound(columns.begin(), columns.end(),
-                                         std::pair(figure.token, figure.scale), before);
+                                         CellKind(figure.token, figure.scale), isBefore);
     found.emplace_back(&figure, at->second + static_cast<std::uint32_t>(column - columns.begin()));
   }
   if (found.empty()) return;
