@@ -1,10 +1,11 @@
 #include "base/uuid.h"
 
+#include "base/ascii.h"
+
 namespace tavrel {
 namespace {
 
 constexpr std::size_t kCharacters = 36;
-constexpr std::string_view kDigits = "0123456789ABCDEF";
 
 constexpr bool isGroupEnd(std::size_t character) {
   return character == 8 || character == 13 || character == 18 || character == 23;
@@ -21,8 +22,7 @@ std::string uuidText(const UuidBytes& bytes) {
   text.reserve(kCharacters);
   for (const std::byte byte : bytes) {
     if (isGroupEnd(text.size())) text += '-';
-    text += kDigits[std::to_integer<unsigned>(byte) >> 4];
-    text += kDigits[std::to_integer<unsigned>(byte) & 0xF];
+    appendHexByte(text, std::to_integer<char>(byte));
   }
   return text;
 }
@@ -32,8 +32,7 @@ std::optional<std::string> normalisedUuid(std::string_view text) {
   std::string normalised;
   normalised.reserve(kCharacters);
   for (const char c : text) {
-    const bool fits =
-        isGroupEnd(normalised.size()) ? c == '-' : kDigits.find(upper(c)) != kDigits.npos;
+    const bool fits = isGroupEnd(normalised.size()) ? c == '-' : hexDigit(c).has_value();
     if (!fits) return std::nullopt;
     normalised += upper(c);
   }

@@ -7,6 +7,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/ascii.h"
 #include "memory_tree.h"
 #include "platform/linux/live/kernel_text.h"
 #include "platform/linux/live/live_machine.h"
@@ -117,7 +118,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
     }
   }
   for (std::string_view rest = contents[last]; !rest.empty();) {
-    const std::string name = live::channelName(live::takeLine(rest));
+    const std::string name = live::channelName(takeLine(rest));
     for (const char c : name)
       require(c > ' ' && c <= '~');
   }

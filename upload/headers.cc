@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/text.h"
@@ -38,16 +39,13 @@ std::string optionsText(const plist::Dictionary& options) {
 }  // namespace
 
 std::string percentEncoded(std::string_view text, std::string_view also) {
-  constexpr std::string_view kDigits = "0123456789ABCDEF";
   std::string out;
   for (const char c : text) {
     if (c >= ' ' && c < 0x7F && c != '%' && also.find(c) == std::string_view::npos) {
       out += c;
     } else {
-      const auto code = static_cast<unsigned char>(c);
       out += '%';
-      out += kDigits[code >> 4];
-      out += kDigits[code & 15];
+      appendHexByte(out, c);
     }
   }
   return out;

@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/ascii.h"
 #include "base/base64.h"
 #include "base/format.h"
 #include "base/iso_date.h"
@@ -73,14 +74,6 @@ Element elementNamed(std::string_view name) {
 
 bool isSpace(char character) {
   return character == ' ' || character == '\t' || character == '\n' || character == '\r';
-}
-
-std::string_view trimmed(std::string_view text) {
-  while (!text.empty() && isSpace(text.front()))
-    text.remove_prefix(1);
-  while (!text.empty() && isSpace(text.back()))
-    text.remove_suffix(1);
-  return text;
 }
 
 /// Shares the text of repeated keys: the dictionaries of a list mostly have the same keys.

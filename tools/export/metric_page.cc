@@ -2,6 +2,7 @@
 
 #include <cmath>
 
+#include "base/ascii.h"
 #include "base/bytes.h"
 #include "base/text.h"
 #include "base/utf8.h"
@@ -11,12 +12,9 @@ namespace tavrel {
 namespace {
 
 void appendEscaped(std::string& out, std::string_view bytes) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
   for (const char byte : bytes) {
-    const auto bits = static_cast<unsigned char>(byte);
     out += '%';
-    out += kDigits[bits >> 4];
-    out += kDigits[bits & 0xF];
+    appendHexByte(out, byte);
   }
 }
 

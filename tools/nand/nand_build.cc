@@ -6,6 +6,7 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "storage/parse/statistic_keys.h"
@@ -32,14 +33,6 @@ std::optional<std::uint32_t> wordOf(const plist::Value& value) {
   const auto number = unsignedOf(value);
   if (!number || *number > kLargestWord) return std::nullopt;
   return static_cast<std::uint32_t>(*number);
-}
-
-std::optional<unsigned> hexDigit(char c) {
-  constexpr std::string_view kDigits = "0123456789abcdef";
-  if (c >= 'A' && c <= 'F') c = static_cast<char>(c - 'A' + 'a');
-  const std::size_t at = kDigits.find(c);
-  if (at == std::string_view::npos) return std::nullopt;
-  return static_cast<unsigned>(at);
 }
 
 /// An element of a statistic, named as in the arrays that `nand parse` lists.

@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/ascii.h"
 #include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/files/folder_walk.h"
@@ -153,8 +154,7 @@ void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
     const int code = enumeration.visit(top, "", folder.bundleType);
     if (enumeration.isFull()) return;
     if (code != 0 && code != ENOENT && code != ENOTDIR) {
-      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top,
-              std::strerror(code));
+      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, std::strerror(code));
     }
   }
 }

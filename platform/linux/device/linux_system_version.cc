@@ -2,6 +2,7 @@
 
 #include <sys/utsname.h>
 
+#include "base/ascii.h"
 #include "base/limits.h"
 #include "platform/linux/files/line_reader.h"
 #include "platform/linux/files/property_list_file.h"
@@ -45,9 +46,7 @@ plist::Dictionary stringsOf(const plist::Dictionary& dictionary) {
 std::optional<std::string> osReleaseValue(std::string_view text, std::string_view name) {
   std::optional<std::string> value;
   while (!text.empty()) {
-    const std::size_t end = text.find('\n');
-    const std::string_view line = trimmed(text.substr(0, end));
-    text.remove_prefix(end == std::string_view::npos ? text.size() : end + 1);
+    const std::string_view line = trimmed(takeLine(text));
     if (line.starts_with(name) && line.size() > name.size() && line[name.size()] == '=') {
       value = unquoted(line.substr(name.size() + 1));
     }

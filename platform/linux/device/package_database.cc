@@ -5,6 +5,7 @@
 #include <string_view>
 #include <unordered_set>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/keyed_hash.h"
 #include "platform/linux/files/line_reader.h"

@@ -24,13 +24,6 @@ Descriptor reopen(const Descriptor& found) {
 
 }  // namespace
 
-std::string_view trimmed(std::string_view text) {
-  constexpr std::string_view kBlank = " \t\r";
-  const std::size_t first = text.find_first_not_of(kBlank);
-  if (first == std::string_view::npos) return {};
-  return text.substr(first, text.find_last_not_of(kBlank) - first + 1);
-}
-
 LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
   // The path may be a user's link to a device, and opening some devices has an effect: a watchdog
   // starts. So look first, and open only what was found.

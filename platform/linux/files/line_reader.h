@@ -16,9 +16,6 @@
 
 namespace tavrel {
 
-/// A line, or part of one, without spaces, tabs and carriage returns at its ends.
-std::string_view trimmed(std::string_view text);
-
 class LineReader {
  public:
   /// Only regular files are opened; a folder, a pipe or a device fails with EINVAL, a file of more

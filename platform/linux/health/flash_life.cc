@@ -2,6 +2,7 @@
 
 #include <charconv>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "platform/linux/files/line_reader.h"
 #include "platform/linux/health/log_page.h"

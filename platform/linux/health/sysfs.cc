@@ -7,6 +7,7 @@
 #include <memory>
 #include <sys/stat.h>
 
+#include "base/ascii.h"
 #include "base/parse_number.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/file_system.h"
@@ -28,9 +29,8 @@ std::optional<std::string> readAttribute(const std::string& path) {
   if (size <= 0) return std::nullopt;
   const std::string_view text =
       trimmed(std::string_view(buffer.data(), static_cast<std::size_t>(size)));
-  const std::size_t end = text.find_last_not_of('\n');
-  if (end == std::string_view::npos) return std::nullopt;
-  return std::string(trimmed(text.substr(0, end + 1)));
+  if (text.empty()) return std::nullopt;
+  return std::string(text);
 }
 
 std::optional<std::int64_t> decimalOf(std::string_view text) {

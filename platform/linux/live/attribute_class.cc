@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <unordered_map>
 
+#include "base/ascii.h"
 #include "base/format.h"
 
 namespace tavrel::live {
@@ -35,7 +36,7 @@ bool fitsPattern(std::string_view name, std::string_view pattern, std::string_vi
   if (name.size() <= head.size() + tail.size()) return false;
   if (!name.starts_with(head) || !name.ends_with(tail)) return false;
   number = name.substr(head.size(), name.size() - head.size() - tail.size());
-  return std::all_of(number.begin(), number.end(), [](char c) { return c >= '0' && c <= '9'; });
+  return std::all_of(number.begin(), number.end(), isDigit);
 }
 
 std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view folder,

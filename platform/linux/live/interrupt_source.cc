@@ -11,6 +11,7 @@
 #include <unordered_map>
 #include <vector>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/keyed_hash.h"
 #include "base/limits.h"

@@ -4,6 +4,7 @@
 #include <charconv>
 #include <unordered_map>
 
+#include "base/ascii.h"
 #include "base/format.h"
 
 namespace tavrel::live {
@@ -52,7 +53,6 @@ std::optional<std::int64_t> parseNumber(std::string_view text) {
   const auto [stop, error] = std::from_chars(text.data(), end, magnitude, isHexadecimal ? 16 : 10);
   if (error == std::errc::invalid_argument) return std::nullopt;
   if (stop != end) {
-    const auto isDigit = [](char c) { return c >= '0' && c <= '9'; };
     if (isHexadecimal || *stop != '.' || !std::all_of(stop + 1, end, isDigit)) return std::nullopt;
   }
   constexpr std::uint64_t kLargest = INT64_MAX;
@@ -75,12 +75,6 @@ std::int64_t saturatingSum(std::int64_t a, std::int64_t b) {
   std::int64_t sum = 0;
   if (!__builtin_add_overflow(a, b, &sum) && sum != kUnset) return sum;
   return a < 0 ? -INT64_MAX : INT64_MAX;
-}
-
-std::string_view takeLine(std::string_view& text) {
-  const std::string_view line = text.substr(0, text.find('\n'));
-  text.remove_prefix(std::min(text.size(), line.size() + 1));
-  return line;
 }
 
 std::string_view takeWord(std::string_view& text) {

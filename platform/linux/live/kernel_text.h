@@ -31,9 +31,6 @@ std::int64_t scaledNumber(std::string_view text, Scale scale);
 /// The sum of two values, neither of them `kUnset`, limited to the largest number.
 std::int64_t saturatingSum(std::int64_t a, std::int64_t b);
 
-/// Takes the next line, without its end.
-std::string_view takeLine(std::string_view& text);
-
 /// Takes the next word; only blanks and ends of lines separate words. Empty at the end.
 std::string_view takeWord(std::string_view& text);
 

@@ -4,6 +4,7 @@
 #include <string>
 #include <vector>
 
+#include "base/ascii.h"
 #include "base/limits.h"
 #include "platform/linux/live/attribute_class.h"
 #include "platform/linux/live/sources.h"

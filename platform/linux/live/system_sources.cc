@@ -5,8 +5,8 @@
 #include <sys/statfs.h>
 #include <sys/statvfs.h>
 #include <unordered_set>
-#include <vector>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/live/sources.h"

@@ -6,6 +6,7 @@
 #include <unordered_set>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/limits.h"
 

@@ -2,17 +2,11 @@
 
 #include <algorithm>
 
+#include "base/ascii.h"
 #include "platform/linux/locale/language_tables.h"
 
 namespace tavrel {
 namespace {
-
-constexpr bool isLetter(char c) {
-  return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
-}
-constexpr bool isDigit(char c) {
-  return c >= '0' && c <= '9';
-}
 
 bool allLetters(std::string_view text) {
   return std::all_of(text.begin(), text.end(), isLetter);

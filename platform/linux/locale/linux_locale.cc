@@ -7,6 +7,7 @@
 #include <sys/stat.h>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/files/file_system.h"

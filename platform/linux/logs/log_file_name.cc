@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <charconv>
 
+#include "base/ascii.h"
 #include "base/civil_time.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/stamp.h"
@@ -15,10 +16,6 @@ constexpr std::size_t kUniqueDigits = 8;
 
 // "YYYYMMDDTHHMMSSZ". Names with years after 9999, which have more digits, are not recognised.
 constexpr std::string_view kStampForm = "00000000T000000Z";
-
-bool isDigit(char c) {
-  return c >= '0' && c <= '9';
-}
 
 std::optional<std::int64_t> secondsOf(std::string_view stamp) {
   const bool hasForm =
@@ -45,8 +42,8 @@ std::optional<std::int64_t> secondsOf(std::string_view stamp) {
 std::string plainLogName(std::string_view logName) {
   std::string part(logName.substr(0, kLongestNamePart));
   for (char& c : part) {
-    const bool isPlain = (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') ||
-                         (c >= '0' && c <= '9') || c == '-' || c == '_' || c == '.';
+    const bool isPlain = (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || isDigit(c) ||
+                         c == '-' || c == '_' || c == '.';
     if (!isPlain) c = '_';
   }
   if (part.empty() || part[0] == '.') part.insert(0, "_");

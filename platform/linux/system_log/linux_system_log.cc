@@ -13,6 +13,7 @@
 #include <time.h>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/utf8.h"
 #include "platform/linux/files/stamp.h"
 
@@ -60,7 +61,6 @@ void appendField(std::string& out, std::string_view name, std::string_view value
 /// Adds text with its control characters, DEL and malformed bytes as "\xNN": messages contain names
 /// from outside, and a terminal would obey control characters.
 void appendPrintable(std::string& out, std::string_view text) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
   while (true) {
     const auto plain = std::ranges::find_if_not(text, isPrintableAscii);
     out.append(text.begin(), plain);
@@ -76,8 +76,8 @@ void appendPrintable(std::string& out, std::string_view text) {
       continue;
     }
     for (const char character : taken) {
-      const auto bits = static_cast<unsigned char>(character);
-      out += {'\\', 'x', kDigits[bits >> 4], kDigits[bits & 0xF]};
+      out += "\\x";
+      appendHexByte(out, character);
     }
   }
 }
