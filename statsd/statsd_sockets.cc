@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <fcntl.h>
 #include <memory>
 #include <netinet/in.h>
@@ -15,6 +14,7 @@
 
 #include "base/activated_descriptors.h"
 #include "base/format.h"
+#include "base/system_text.h"
 
 namespace tavrel {
 namespace {
@@ -52,7 +52,7 @@ std::string_view adviceFor(int code) {
 }
 
 Error failure(std::string_view what, int code = errno) {
-  return Error{format("%s: %s%s", what, std::strerror(code), adviceFor(code))};
+  return Error{format("%s: %s%s", what, systemText(code), adviceFor(code))};
 }
 
 Expected<DatagramSocket> newSocket(int family) {

@@ -1,11 +1,11 @@
 #include "tools/shared/output_file.h"
 
 #include <cerrno>
-#include <cstring>
 #include <filesystem>
 #include <ostream>
 
 #include "base/format.h"
+#include "base/system_text.h"
 #include "platform/linux/files/file_system.h"
 
 namespace tavrel {
@@ -31,7 +31,7 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
   // A missing folder is probably a typing error, so do not make it.
   const auto folder = path.parent_path().string();
   if (!FileSystem::status(folder)) {
-    const char* const reason = std::strerror(errno);
+    const std::string reason = systemText(errno);
     return Error{format("cannot write %s: %s: %s", file, folder, reason)};
   }
   return FileSystem().replace(path.string(), asBytes(bytes), 0644);

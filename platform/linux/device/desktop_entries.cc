@@ -13,6 +13,7 @@
 #include "base/ascii.h"
 #include "base/keyed_hash.h"
 #include "base/limits.h"
+#include "base/system_text.h"
 #include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/line_reader.h"
 
@@ -154,7 +155,7 @@ void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
     const int code = enumeration.visit(top, "", folder.bundleType);
     if (enumeration.isFull()) return;
     if (code != 0 && code != ENOENT && code != ENOTDIR) {
-      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, std::strerror(code));
+      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, systemText(code));
     }
   }
 }

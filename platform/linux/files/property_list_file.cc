@@ -1,10 +1,10 @@
 #include "platform/linux/files/property_list_file.h"
 
 #include <cerrno>
-#include <system_error>
 #include <unistd.h>
 
 #include "base/limits.h"
+#include "base/system_text.h"
 
 namespace tavrel {
 
@@ -25,7 +25,7 @@ plist::Dictionary readDictionaryFile(FileSystem& files, PropertyListCoding& prop
 
 std::string reasonToDistrust(const std::string& path) {
   const auto status = FileSystem::status(path);
-  if (!status) return "its owner is unknown: " + std::generic_category().message(errno);
+  if (!status) return "its owner is unknown: " + systemText(errno);
   if ((status->st_uid == 0 || status->st_uid == geteuid()) &&
       (status->st_mode & (S_IWGRP | S_IWOTH)) == 0) {
     return {};

@@ -1,7 +1,8 @@
 #include "platform/linux/files/system_error.h"
 
-#include <system_error>
 #include <unistd.h>
+
+#include "base/system_text.h"
 
 namespace tavrel {
 namespace {
@@ -31,7 +32,7 @@ Error systemError(std::string_view what, std::string_view path, int code) {
   message += ' ';
   message += path;
   message += ": ";
-  message += std::generic_category().message(code);
+  message += systemText(code);
   message += adviceFor(code);
   return Error{std::move(message)};
 }

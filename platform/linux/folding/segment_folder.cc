@@ -9,10 +9,10 @@
 #include <memory>
 #include <random>
 #include <sys/vfs.h>
-#include <system_error>
 #include <unistd.h>
 
 #include "base/limits.h"
+#include "base/system_text.h"
 #include "base/text.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/system_error.h"
@@ -166,12 +166,11 @@ Expected<SegmentOpening> SegmentFolder::openSegment(const SegmentEntry& entry) c
     if (errno == ENOENT) return SegmentOpening();
     if (isSystemsFailure(errno)) return systemError("open", path_ + "/" + entry.name);
     if (errno == ELOOP) return refuse("a symbolic link");
-    return refuse(std::generic_category().message(errno), adviceFor(errno));
+    return refuse(systemText(errno), adviceFor(errno));
   }
   struct stat status {};
   if (fstat(segment.file.get(), &status) != 0) {
-    return refuse("it cannot be examined: " + std::generic_category().message(errno),
-                  adviceFor(errno));
+    return refuse("it cannot be examined: " + systemText(errno), adviceFor(errno));
   }
   // The segment was removed after it was listed.
   if (status.st_nlink == 0) return SegmentOpening();

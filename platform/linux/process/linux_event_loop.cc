@@ -3,13 +3,13 @@
 #include <algorithm>
 #include <cerrno>
 #include <chrono>
-#include <cstring>
 #include <sys/epoll.h>
 #include <sys/signalfd.h>
 #include <thread>
 #include <unistd.h>
 
 #include "base/format.h"
+#include "base/system_text.h"
 
 namespace tavrel {
 
@@ -60,13 +60,13 @@ bool LinuxEventLoop::openPoll() {
 }
 
 Expected<LinuxEventLoop::Source> LinuxEventLoop::watch(int descriptor, Callback callback) {
-  if (!openPoll()) return Error{format("cannot open an event queue: %s", std::strerror(errno))};
+  if (!openPoll()) return Error{format("cannot open an event queue: %s", systemText(errno))};
   const std::uint64_t id = ++lastId_;
   epoll_event interest{};
   interest.events = EPOLLIN;
   interest.data.u64 = id;
   if (epoll_ctl(poll_.get(), EPOLL_CTL_ADD, descriptor, &interest) != 0) {
-    return Error{format("cannot wait for descriptor %d: %s", descriptor, std::strerror(errno))};
+    return Error{format("cannot wait for descriptor %d: %s", descriptor, systemText(errno))};
   }
   callbacks_.emplace(id, std::make_shared<Callback>(std::move(callback)));
   Source source;

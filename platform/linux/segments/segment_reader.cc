@@ -6,11 +6,11 @@
 #include <ctime>
 #include <limits>
 #include <sys/stat.h>
-#include <system_error>
 #include <unistd.h>
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
+#include "base/system_text.h"
 #include "client/segment_format.h"
 
 namespace tavrel {
@@ -178,16 +178,16 @@ SegmentReader::ChunkLook SegmentReader::chunkIn(ByteSpan bytes,
 
 Status SegmentReader::readable() const {
   if (file_.error() == 0) return Done{};
-  return Error{"cannot read a segment: " + std::generic_category().message(file_.error())};
+  return Error{"cannot read a segment: " + systemText(file_.error())};
 }
 
 Expected<SegmentReader::State> SegmentReader::state() const {
   struct stat status {};
-  if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
+  if (fstat(descriptor_, &status) != 0) return Error{systemText(errno)};
   if (!S_ISREG(status.st_mode)) return Error{"not a regular file"};
   const std::uint64_t magic = file_.word64(kBHHeaderMagic);
   // Checked again after the magic, before which the process sets the file's size.
-  if (fstat(descriptor_, &status) != 0) return Error{std::generic_category().message(errno)};
+  if (fstat(descriptor_, &status) != 0) return Error{systemText(errno)};
   if (magic == 0 && (status.st_size == 0 || status.st_size == kBHSegmentBytes)) return State::Empty;
   if (magic != kBHSegmentMagic) return Error{"not a segment"};
   if (const std::uint32_t version = file_.word32(kBHHeaderVersion); version != kBHSegmentVersion) {
@@ -375,11 +375,11 @@ Status acknowledge(int descriptor, const SegmentProgress& progress) {
   };
   for (const SegmentProgress::Acknowledgement& done : progress.acknowledgements) {
     if (!write(done.offset, &done.word, sizeof done.word)) {
-      return Error{std::generic_category().message(errno)};
+      return Error{systemText(errno)};
     }
   }
   if (!write(kBHHeaderFolds, &progress.nextFolds, sizeof progress.nextFolds)) {
-    return Error{std::generic_category().message(errno)};
+    return Error{systemText(errno)};
   }
   return Done{};
 }

@@ -1,12 +1,12 @@
 #include "platform/linux/service/service_client.h"
 
 #include <cerrno>
-#include <cstring>
 #include <string>
 #include <sys/socket.h>
 #include <sys/time.h>
 
 #include "base/format.h"
+#include "base/system_text.h"
 #include "platform/linux/service/service_message.h"
 #include "platform/linux/service/service_socket.h"
 
@@ -35,7 +35,7 @@ Expected<ServiceClient> ServiceClient::connect(const DeviceRoot& root, std::stri
   if (!isServiceName(name)) return Error{format("%s is not the name of a service", name)};
   const std::string path = serviceSocketPath(root, name);
   const auto failure = [&path] {
-    return Error{format("cannot connect to %s: %s%s", path, std::strerror(errno), advice(errno))};
+    return Error{format("cannot connect to %s: %s%s", path, systemText(errno), advice(errno))};
   };
   const auto address = SocketAddress::of(path);
   if (!address) return address.error();

@@ -14,6 +14,7 @@
 
 #include "base/format.h"
 #include "base/limits.h"
+#include "base/system_text.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/coding.h"
@@ -25,7 +26,7 @@ namespace {
 constexpr int kNeededSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
 
 Error systemFailure(const char* what) {
-  return Error{format("%s: %s", what, std::strerror(errno))};
+  return Error{format("%s: %s", what, systemText(errno))};
 }
 
 Expected<plist::Dictionary> readMessageFile(int file) {

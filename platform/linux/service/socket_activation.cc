@@ -2,7 +2,6 @@
 
 #include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <fcntl.h>
 #include <string>
 #include <sys/socket.h>
@@ -11,6 +10,7 @@
 
 #include "base/activated_descriptors.h"
 #include "base/limits.h"
+#include "base/system_text.h"
 
 namespace tavrel {
 
@@ -87,7 +87,7 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
   const int flags = socket ? fcntl(socket.get(), F_GETFL) : -1;
   if (flags < 0 || fcntl(socket.get(), F_SETFL, flags | O_NONBLOCK) != 0) {
     log.log(LogLevel::Error, "cannot use descriptor %d of LISTEN_FDS: %s", chosen,
-            std::strerror(errno));
+            systemText(errno));
     return {};
   }
   return socket;

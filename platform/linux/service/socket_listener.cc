@@ -1,13 +1,13 @@
 #include "platform/linux/service/socket_listener.h"
 
 #include <cerrno>
-#include <cstring>
 #include <sys/timerfd.h>
 #include <unistd.h>
 #include <utility>
 #include <variant>
 
 #include "base/limits.h"
+#include "base/system_text.h"
 #include "platform/linux/service/service_message.h"
 
 namespace tavrel {
@@ -136,13 +136,13 @@ void SocketListener::acceptFailed(int code) {
       timerfd_settime(retryTimer_.get(), 0, &kRetry, nullptr);
       if (!std::exchange(isShort_, true)) {
         refusals_.write(
-            format("%s: new peers wait, tried each second: %s", name_, std::strerror(code)));
+            format("%s: new peers wait, tried each second: %s", name_, systemText(code)));
       }
       return;
     default:
       source_.stop();
       log_.log(LogLevel::Error, "%s: no further peers are taken: %s; restart the service", name_,
-               std::strerror(code));
+               systemText(code));
   }
 }
 
