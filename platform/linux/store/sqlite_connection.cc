@@ -10,9 +10,11 @@
 #include <unistd.h>
 #include <utility>
 
-#include "platform/linux/store/sqlite_index_room.h"
+#include "base/ascii.h"
+#include "base/system_text.h"
 #include "platform/linux/store/sqlite_library.h"
 #include "platform/linux/store/sqlite_log_file.h"
+#include "platform/linux/store/wal_index_allocation.h"
 
 namespace tavrel {
 namespace {
@@ -86,7 +88,7 @@ int systemCodeOf(sqlite3* connection, int code) {
   std::string message = connection ? sqlite().errmsg(connection) : sqlite().errstr(code);
   if (const int systemCode = connection ? systemCodeOf(connection, code) : 0) {
     message += " (";
-    message += std::strerror(systemCode);
+    message += systemText(systemCode);
     message += ')';
     advice = adviceFor(systemCode, advice);
     if (advice == kFreeSpace) fault = StoreFault::Device;
@@ -101,14 +103,11 @@ int waitForLock(void* busy, int) {
 // SQLite's URI form is the only way to ask for an immutable file; "%", "?" and "#" are special in
 // it.
 std::string immutableUri(const std::string& path) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
   std::string uri = "file:";
   for (const char character : path) {
     if (character == '%' || character == '?' || character == '#') {
-      const auto bits = static_cast<unsigned char>(character);
       uri += '%';
-      uri += kDigits[bits >> 4];
-      uri += kDigits[bits & 0xF];
+      appendHexByte(uri, character);
     } else {
       uri += character;
     }
@@ -164,7 +163,7 @@ SqliteConnection::SqliteConnection(const std::string& path, Access access,
   const int code = sqlite().open_v2(name.c_str(), &handle_, flags, nullptr);
   try {
     if (code != SQLITE_OK) throwFailure(handle_, code);
-    indexRoom_ = std::make_unique<IndexRoom>(handle_);
+    walIndexAllocation_ = std::make_unique<WalIndexAllocation>(handle_);
     sqlite().busy_handler(handle_, waitForLock, busy_.get());
     // The file may come from anywhere, so nothing in its schema may run.
     sqlite().db_config(handle_, SQLITE_DBCONFIG_DEFENSIVE, 1, nullptr);
@@ -191,12 +190,12 @@ SqliteConnection::~SqliteConnection() {
 SqliteConnection::SqliteConnection(SqliteConnection&& other) noexcept
     : handle_(std::exchange(other.handle_, nullptr)),
       busy_(std::move(other.busy_)),
-      indexRoom_(std::move(other.indexRoom_)) {}
+      walIndexAllocation_(std::move(other.walIndexAllocation_)) {}
 
 SqliteConnection& SqliteConnection::operator=(SqliteConnection&& other) noexcept {
   std::swap(handle_, other.handle_);
   std::swap(busy_, other.busy_);
-  std::swap(indexRoom_, other.indexRoom_);
+  std::swap(walIndexAllocation_, other.walIndexAllocation_);
   return *this;
 }
 

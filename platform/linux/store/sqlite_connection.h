@@ -22,7 +22,7 @@ struct sqlite3_stmt;
 
 namespace tavrel {
 
-class IndexRoom;
+class WalIndexAllocation;
 
 enum class StoreFault : std::uint8_t {
   Damaged,  // SQLite reports the file as corrupt, or as no database
@@ -93,7 +93,7 @@ class SqliteConnection {
  private:
   sqlite3* handle_ = nullptr;
   std::shared_ptr<BusyBudget> busy_;
-  std::unique_ptr<IndexRoom> indexRoom_;
+  std::unique_ptr<WalIndexAllocation> walIndexAllocation_;
 };
 
 class SqliteStatement {

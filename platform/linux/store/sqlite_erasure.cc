@@ -126,46 +126,60 @@ bool StoreErasure::eraseSome(std::string_view table, std::int64_t day, const std
   ErasedRows sum = erased;
   connection_.execute("BEGIN IMMEDIATE");
   const auto keys = nextKeys(connection_, table, day, prefix);
-  {
-    SqliteStatement removeRow(connection_,
-                              statement("DELETE FROM ", table, " WHERE day = ?1 AND key = ?2"));
-    SqliteStatement row(connection_,
-                        "SELECT count, runs FROM distributions WHERE day = ?1 AND key = ?2");
-    SqliteStatement removeChunks(connection_,
-                                 "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
-    std::int64_t chunks = 0;
-    for (const std::string& key : keys) {
-      if (chunks >= kChunksAtOnce) break;
-      if (table == "distributions") {
-        row.bind(1, day);
-        row.bind(2, std::string_view(key));
-        const bool isThere = row.step();
-        auto runs = isThere ? unpackRuns(row.bytes(1)) : std::nullopt;
-        // The chunks that a damaged row refers to may belong to another row.
-        if (runs && valuesIn(*runs) != row.integer(0)) runs.reset();
-        sum.distributions += isThere ? 1U : 0U;
-        sum.values +=
-            isThere ? static_cast<std::uint64_t>(std::max<std::int64_t>(row.integer(0), 0)) : 0;
-        sum.damaged += isThere && !runs ? 1U : 0U;
-        row.reset();
-        for (const ChunkRun& run : runs.value_or(std::vector<ChunkRun>())) {
-          removeChunks.bind(1, run.first);
-          removeChunks.bind(2, run.end());
-          removeChunks.run();
-          chunks += run.end() - run.first;
-        }
-      } else {
-        ++sum.scalars;
-      }
-      removeRow.bind(1, day);
-      removeRow.bind(2, std::string_view(key));
-      removeRow.runOnFound();
-    }
+  if (table == "distributions") {
+    eraseDistributions(day, keys, sum);
+  } else {
+    eraseScalars(day, keys, sum);
   }
   connection_.execute("COMMIT");
   erased = sum;
   limitLog();
   return !keys.empty();
+}
+
+void StoreErasure::eraseScalars(std::int64_t day, const std::vector<std::string>& keys,
+                                ErasedRows& erased) {
+  SqliteStatement removeRow(connection_, "DELETE FROM scalars WHERE day = ?1 AND key = ?2");
+  for (const std::string& key : keys) {
+    removeRow.bind(1, day);
+    removeRow.bind(2, std::string_view(key));
+    removeRow.runOnFound();
+    ++erased.scalars;
+  }
+}
+
+// Leaves the last ones to the next transaction when there are too many chunks.
+void StoreErasure::eraseDistributions(std::int64_t day, const std::vector<std::string>& keys,
+                                      ErasedRows& erased) {
+  SqliteStatement row(connection_,
+                      "SELECT count, runs FROM distributions WHERE day = ?1 AND key = ?2");
+  SqliteStatement removeChunks(connection_, "DELETE FROM chunks WHERE chunk >= ?1 AND chunk < ?2");
+  SqliteStatement removeRow(connection_, "DELETE FROM distributions WHERE day = ?1 AND key = ?2");
+  std::int64_t chunks = 0;
+  for (const std::string& key : keys) {
+    if (chunks >= kChunksAtOnce) break;
+    row.bind(1, day);
+    row.bind(2, std::string_view(key));
+    if (row.step()) {
+      const std::int64_t count = row.integer(0);
+      auto runs = unpackRuns(row.bytes(1));
+      // The chunks that a damaged row refers to may belong to another row.
+      if (runs && valuesIn(*runs) != count) runs.reset();
+      ++erased.distributions;
+      erased.values += static_cast<std::uint64_t>(std::max<std::int64_t>(count, 0));
+      erased.damaged += runs ? 0U : 1U;
+      for (const ChunkRun& run : runs.value_or(std::vector<ChunkRun>())) {
+        removeChunks.bind(1, run.first);
+        removeChunks.bind(2, run.end());
+        removeChunks.run();
+        chunks += run.end() - run.first;
+      }
+    }
+    row.reset();
+    removeRow.bind(1, day);
+    removeRow.bind(2, std::string_view(key));
+    removeRow.runOnFound();
+  }
 }
 
 void StoreErasure::eraseStrayChunks() {
@@ -174,8 +188,10 @@ void StoreErasure::eraseStrayChunks() {
     connection_.execute("BEGIN IMMEDIATE");
     // Chunks that another process has recorded in the meantime have rows.
     if (connection_.integer("SELECT count(*) FROM (SELECT 1 FROM distributions LIMIT 1)") == 0) {
-      connection_.execute(
-          "DELETE FROM chunks WHERE chunk IN (SELECT chunk FROM chunks LIMIT 4096)");
+      SqliteStatement remove(
+          connection_, "DELETE FROM chunks WHERE chunk IN (SELECT chunk FROM chunks LIMIT ?1)");
+      remove.bind(1, kChunksAtOnce);
+      remove.run();
       isDone = connection_.integer("SELECT changes()") == 0;
     } else {
       isDone = true;

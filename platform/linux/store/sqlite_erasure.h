@@ -13,6 +13,7 @@
 #include <limits>
 #include <string>
 #include <string_view>
+#include <vector>
 
 #include "platform/linux/store/sqlite_connection.h"
 
@@ -66,6 +67,9 @@ class StoreErasure {
   void eraseTable(std::string_view table, const RowRange& range, ErasedRows& erased);
   bool eraseSome(std::string_view table, std::int64_t day, const std::string& prefix,
                  ErasedRows& erased);
+  void eraseScalars(std::int64_t day, const std::vector<std::string>& keys, ErasedRows& erased);
+  void eraseDistributions(std::int64_t day, const std::vector<std::string>& keys,
+                          ErasedRows& erased);
   void limitLog();
 
   SqliteConnection& connection_;

@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "base/system_text.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/sqlite_log_file.h"
@@ -75,7 +76,7 @@ bool checkIsFile(const std::string& path) {
   struct stat status;
   if (lstat(path.c_str(), &status) != 0) {
     if (errno == ENOENT || errno == ENOTDIR) return false;
-    throw StoreFailure{StoreFault::Refused, std::string("cannot be read: ") + std::strerror(errno) +
+    throw StoreFailure{StoreFault::Refused, "cannot be read: " + systemText(errno) +
                                                 ": check owner and permissions of its folder"};
   }
   if (!S_ISREG(status.st_mode)) {

@@ -8,9 +8,10 @@
 #include <unistd.h>
 
 #include "base/arithmetic.h"
+#include "base/system_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/stamp.h"
-#include "platform/linux/store/second_look.h"
+#include "platform/linux/store/damage_check.h"
 #include "platform/statistics_store.h"
 
 namespace tavrel {
@@ -69,7 +70,7 @@ StoreFolderLock::StoreFolderLock(const std::string& storePath, BusyBudget& busy)
     const int code = errno;
     if ((code != EWOULDBLOCK && code != EINTR) || !busy.wait()) {
       throw StoreFailure{StoreFault::Busy,
-                         std::string("its folder cannot be locked: ") + std::strerror(code) +
+                         "its folder cannot be locked: " + systemText(code) +
                              ": try again when the process that holds it has finished"};
     }
   }
@@ -88,13 +89,13 @@ void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) 
 std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity>& damaged,
                                                 const StoreFailure& failure) const {
   if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
-  if (auto doubt = doubtDamage(path, busy, changesNothing)) return doubt;
+  if (auto other = confirmDamage(path, busy, changesNothing)) return other;
   if (changesNothing) {
     return StoreFailure{failure.fault, failure.message + "; the next run sets it aside"};
   }
   try {
     const StoreFolderLock lock(path, *busy);
-    if (!damaged || FileIdentity::of(path) != damaged) return std::nullopt;
+    if (FileIdentity::of(path) != damaged) return std::nullopt;
     withholdFromOthers(path);
     const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
     // The log goes first. If the process is killed in between, the file is found damaged again; a
@@ -102,7 +103,7 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
     if (!moveFile(path + "-wal", name + "-wal") || !moveFile(path + "-shm", name + "-shm") ||
         !moveFile(path, name)) {
       throw StoreFailure{StoreFault::Refused, std::string("it cannot be set aside: ") +
-                                                  std::strerror(errno) +
+                                                  systemText(errno) +
                                                   ": run as the owner of its folder"};
     }
     log.write(LogLevel::Error, describe(failure) + "; it is now " + name +

@@ -11,7 +11,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "platform/guarded.h"
-#include "platform/linux/store/second_look.h"
+#include "platform/linux/store/damage_check.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/store_path.h"
 

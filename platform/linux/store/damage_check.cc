@@ -1,4 +1,4 @@
-#include "platform/linux/store/second_look.h"
+#include "platform/linux/store/damage_check.h"
 
 #include <algorithm>
 #include <array>
@@ -9,6 +9,7 @@
 #include <sqlite3.h>
 #include <unistd.h>
 
+#include "base/system_text.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/sqlite_library.h"
 #include "platform/linux/store/sqlite_schema.h"
@@ -19,7 +20,7 @@ namespace {
 constexpr std::size_t kBlock = 64 << 10;
 
 StoreFailure unreadable(const char* what, int code) {
-  return {StoreFault::Device, std::string(what) + " cannot be read (" + std::strerror(code) +
+  return {StoreFault::Device, std::string(what) + " cannot be read (" + systemText(code) +
                                   "): check the file system that holds it"};
 }
 
@@ -68,9 +69,9 @@ bool isSound(SqliteConnection& connection) {
   return check.step() && check.bytes(0) == "ok";
 }
 
-std::optional<StoreFailure> doubtDamage(const std::string& path,
-                                        const std::shared_ptr<BusyBudget>& busy,
-                                        bool leavesNoTrace) {
+std::optional<StoreFailure> confirmDamage(const std::string& path,
+                                          const std::shared_ptr<BusyBudget>& busy,
+                                          bool leavesNoTrace) {
   try {
     try {
       auto store = openStoreForReading(path, busy, leavesNoTrace);

@@ -2,21 +2,21 @@
 //
 // SQLite maps the index, the "-shm" file, and writes into the mapping. It extends the file by
 // writing one byte per page of 4 KiB, which leaves holes on a file system with smaller blocks. On a
-// full disk, a write into a hole raises SIGBUS. An `IndexRoom` allocates every page of the index
-// before SQLite sees it. On a full disk, writers and readers then get SQLITE_FULL.
+// full disk, a write into a hole raises SIGBUS. A `WalIndexAllocation` allocates every page of the
+// index before SQLite sees it. On a full disk, writers and readers then get SQLITE_FULL.
 #pragma once
 
 #include <sqlite3.h>
 
 namespace tavrel {
 
-class IndexRoom {
+class WalIndexAllocation {
  public:
   /// Intercepts the connection's calls on its file. The connection must not have run a statement
   /// yet. Must outlive the connection.
-  explicit IndexRoom(sqlite3* connection);
-  IndexRoom(const IndexRoom&) = delete;
-  IndexRoom& operator=(const IndexRoom&) = delete;
+  explicit WalIndexAllocation(sqlite3* connection);
+  WalIndexAllocation(const WalIndexAllocation&) = delete;
+  WalIndexAllocation& operator=(const WalIndexAllocation&) = delete;
 
  private:
   // SQLite calls this instead of the file's own methods. It must be the first member: SQLite's

@@ -1,4 +1,4 @@
-#include "platform/linux/store/sqlite_index_room.h"
+#include "platform/linux/store/wal_index_allocation.h"
 
 #include <cerrno>
 #include <cstddef>
@@ -10,7 +10,7 @@
 
 namespace tavrel {
 
-IndexRoom::IndexRoom(sqlite3* connection) {
+WalIndexAllocation::WalIndexAllocation(sqlite3* connection) {
   sqlite3_file* file = nullptr;
   const int code = sqlite().file_control(connection, "main", SQLITE_FCNTL_FILE_POINTER,
                                          static_cast<void*>(&file));
@@ -20,8 +20,8 @@ IndexRoom::IndexRoom(sqlite3* connection) {
   file->pMethods = &methods_.replaced;
 }
 
-int IndexRoom::mapIndex(sqlite3_file* file, int region, int bytes, int extends,
-                        void volatile** at) {
+int WalIndexAllocation::mapIndex(sqlite3_file* file, int region, int bytes, int extends,
+                                 void volatile** at) {
   const auto* const methods = reinterpret_cast<const Methods*>(file->pMethods);
   const int code = methods->own->xShmMap(file, region, bytes, extends, at);
   if (code != SQLITE_OK || !*at) return code;

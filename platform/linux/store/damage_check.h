@@ -17,8 +17,8 @@ bool isSound(SqliteConnection& connection);
 /// Checks on connections of its own; this process must have no other open one. Nothing when the
 /// store is damaged and every byte can be read; otherwise the failure to report instead. Takes as
 /// long as reading the whole file. `leavesNoTrace`: see `openStoreForReading`.
-std::optional<StoreFailure> doubtDamage(const std::string& path,
-                                        const std::shared_ptr<BusyBudget>& busy,
-                                        bool leavesNoTrace);
+std::optional<StoreFailure> confirmDamage(const std::string& path,
+                                          const std::shared_ptr<BusyBudget>& busy,
+                                          bool leavesNoTrace);
 
 }  // namespace tavrel
