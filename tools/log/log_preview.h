@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "report/log_outcome.h"
-#include "tools/overlay/overlay_writes.h"
+#include "tools/overlay/captured_log.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {

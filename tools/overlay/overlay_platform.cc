@@ -12,6 +12,7 @@
 #include "platform/plist/coding.h"
 #include "tools/overlay/overlay_drivers.h"
 #include "tools/overlay/overlay_reads.h"
+#include "tools/overlay/overlay_writes.h"
 
 namespace tavrel {
 namespace {

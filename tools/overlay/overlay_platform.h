@@ -15,8 +15,8 @@
 #include <vector>
 
 #include "platform/platform.h"
+#include "tools/overlay/captured_log.h"
 #include "tools/overlay/overlay_events.h"
-#include "tools/overlay/overlay_writes.h"
 
 namespace tavrel {
 
