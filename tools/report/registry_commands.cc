@@ -20,6 +20,7 @@
 #include "tools/report/report_selection.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/output_file.h"
+#include "tools/shared/subcommand.h"
 #include "tools/shared/table.h"
 #include "tools/shared/value_text.h"
 
@@ -163,14 +164,6 @@ std::string secondsFault(const std::string& text) {
   const auto seconds = parseWord(text);
   if (seconds && *seconds <= kMostSeconds) return {};
   return format("not a number of seconds: %s: give 0 to %llu", text, kMostSeconds);
-}
-
-Command addCommand(Command group, const char* name, const char* description,
-                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                   void (*action)(ToolContext&, const Arguments&)) {
-  const Command command = group.addCommand(name, description);
-  command.onRun([&context, arguments, action] { action(context, *arguments); });
-  return command;
 }
 
 }  // namespace

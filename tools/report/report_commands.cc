@@ -18,6 +18,7 @@
 #include "tools/report/report_selection.h"
 #include "tools/report/report_view.h"
 #include "tools/shared/noting_platform.h"
+#include "tools/shared/subcommand.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -148,23 +149,16 @@ void describe(ToolContext& context, const Arguments& arguments) {
 }
 
 // What is wrong with an option's text; empty when nothing is.
-
 std::string secondsFault(const std::string& text) {
   const auto seconds = parseNumber<double>(text);
   if (seconds && *seconds >= 0 && *seconds <= kLongestInterval) return {};
   return format("not a number of seconds: %s: give 0 to 86400, such as 0.5", text);
 }
 
-std::string countFault(const std::string& text) {
-  if (parseNumber<std::uint32_t>(text).value_or(0) > 0) return {};
-  return format("not a number of samples: %s: give 1 or more", text);
-}
-
-Command addCommand(Command group, const char* name, const char* description,
-                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                   void (*action)(ToolContext&, const Arguments&)) {
-  const Command command = group.addCommand(name, description);
-  command.onRun([&context, arguments, action] { action(context, *arguments); });
+Command addSelecting(Command group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  const Command command = addCommand(group, name, description, arguments, context, action);
   addSelectionOptions(command, arguments->selection);
   return command;
 }
@@ -175,24 +169,24 @@ void addReportCommands(Command app, ToolContext& context) {
   const Command group = app.addGroup("report", "Report channels that drivers publish");
   const auto arguments = std::make_shared<Arguments>();
 
-  const Command listed = addCommand(group, "list", "List channels by driver, group and subgroup",
-                                    arguments, context, list);
+  const Command listed = addSelecting(group, "list", "List channels by driver, group and subgroup",
+                                      arguments, context, list);
   listed.addFlag("--flat", arguments->flat, "A table, one line per channel");
   context.addJsonOption(listed);
 
   const Command sampled =
-      addCommand(group, "sample", "Show the values of channels", arguments, context, sample);
+      addSelecting(group, "sample", "Show the values of channels", arguments, context, sample);
   sampled.addOption("--interval", arguments->interval, "Seconds between samples (default 1)")
       .typeName("S")
       .check(secondsFault);
   sampled.addOption("--count", arguments->count, "How many samples (default 1)")
       .typeName("N")
-      .check(countFault);
+      .check([](const std::string& text) { return countFault(text, "samples"); });
   sampled.addFlag("--delta", arguments->delta, "Show what changed since the previous sample");
   context.addJsonOption(sampled);
 
-  const Command described = addCommand(group, "describe", "Print the system's own descriptions",
-                                       arguments, context, describe);
+  const Command described = addSelecting(group, "describe", "Print the system's own descriptions",
+                                         arguments, context, describe);
   described.addFlag("--channels", arguments->channelsOnly, "Of the channels only, not of values");
 }
 

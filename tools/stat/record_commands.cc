@@ -5,6 +5,7 @@
 
 #include "base/format.h"
 #include "base/parse_number.h"
+#include "tools/shared/subcommand.h"
 #include "tools/stat/import_number.h"
 #include "tools/stat/value_recorder.h"
 
@@ -62,13 +63,10 @@ void record(ToolContext& context, const Arguments& arguments) {
   });
 }
 
-using Action = void (*)(ToolContext&, const Arguments&);
-
-Command addCommand(Command group, const char* name, const char* description,
-                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                   Action action) {
-  const Command command = group.addCommand(name, description);
-  command.onRun([&context, arguments, action] { action(context, *arguments); });
+Command addRecording(Command group, const char* name, const char* description,
+                     const std::shared_ptr<Arguments>& arguments, ToolContext& context,
+                     void (*action)(ToolContext&, const Arguments&)) {
+  const Command command = addCommand(group, name, description, arguments, context, action);
   command.addOption("KEY", arguments->key, "Name of the statistic").required();
   return command;
 }
@@ -77,15 +75,15 @@ Command addCommand(Command group, const char* name, const char* description,
 
 void addRecordCommands(Command group, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
-  addCommand(group, "set", "Set today's value of a scalar", arguments, context,
-             changeScalar<&ValueRecorder::set>)
+  addRecording(group, "set", "Set today's value of a scalar", arguments, context,
+               changeScalar<&ValueRecorder::set>)
       .addOption("N", arguments->number, "64-bit integer")
       .required();
-  addCommand(group, "add", "Add to today's value of a scalar", arguments, context,
-             changeScalar<&ValueRecorder::add>)
+  addRecording(group, "add", "Add to today's value of a scalar", arguments, context,
+               changeScalar<&ValueRecorder::add>)
       .addOption("N", arguments->number, "64-bit integer")
       .required();
-  addCommand(group, "record", "Append values to today's distribution", arguments, context, record)
+  addRecording(group, "record", "Append values to today's distribution", arguments, context, record)
       .addOption("VALUE", arguments->values,
                  "Numbers: 2, -1.5, 1e-3, 0x1p-3, inf, nan; put -- before -inf and -nan")
       .required();

@@ -1,11 +1,14 @@
 #include "tools/stat/stat_commands.h"
 
+#include <chrono>
+#include <cstdint>
 #include <memory>
+#include <optional>
+#include <string>
 
-#include "base/format.h"
-#include "base/parse_number.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
+#include "tools/shared/subcommand.h"
 #include "tools/stat/collect.h"
 #include "tools/stat/machine_statistics.h"
 #include "tools/stat/record_commands.h"
@@ -17,135 +20,104 @@
 namespace tavrel {
 namespace {
 
-struct Arguments {
-  std::string file = "-";
-  std::string key;
+struct Selection {
+  std::string prefix;
   std::string day;
-  std::uint32_t seconds = 5;
-  bool once = false;
-  std::optional<std::uint32_t> period;  // seconds
-  std::string stateFile;
-  std::optional<std::uint32_t> days;
 };
 
-// Parses a day from the command line. False, after a message, when it is not one.
-bool parseDayOption(ToolContext& context, const std::string& text,
-                    std::optional<std::int32_t>& day) {
-  if (text.empty()) return true;
-  const auto parsed = parseDay(text, context.platform().statistics->BHDaysSince1970());
-  if (!parsed) {
-    context.failUsage(parsed.error().message);
-    return false;
-  }
-  day = *parsed;
-  return true;
+// Calls `show` with the prefix and the day; reports a day that is none.
+template <void (*show)(ToolContext&, const std::string&, std::optional<std::int32_t>)>
+void showSelected(ToolContext& context, const Selection& selection) {
+  if (selection.day.empty()) return show(context, selection.prefix, std::nullopt);
+  const auto day = parseDay(selection.day, context.platform().statistics->BHDaysSince1970());
+  if (!day) return context.failUsage(day.error().message);
+  show(context, selection.prefix, *day);
 }
 
-Command addCommand(Command group, const char* name, const char* description,
-                   const std::shared_ptr<Arguments>& arguments, ToolContext& context,
-                   void (*action)(ToolContext&, const Arguments&)) {
-  const Command command = group.addCommand(name, description);
-  command.onRun([&context, arguments, action] { action(context, *arguments); });
-  return command;
-}
-
-bool isPositiveNumber(const std::string& text) {
-  return parseNumber<std::uint32_t>(text).value_or(0) > 0;
-}
-
-// What is wrong with the text of --days or --every; empty when nothing is.
-std::string daysFault(const std::string& text) {
-  if (isPositiveNumber(text)) return {};
-  return format("not a number of days: %s: give 1 or more", text);
-}
-
-std::string periodFault(const std::string& text) {
-  if (isPositiveNumber(text)) return {};
-  return format("not a number of seconds: %s: give 1 or more", text);
-}
-
-void addKey(Command command, Arguments& arguments) {
-  command.addOption("KEY", arguments.key, "Name of the statistic").required();
-}
-
-void addSelection(Command command, Arguments& arguments) {
-  command.addOption("PREFIX", arguments.key, "Only keys that begin with this");
+void addSelection(Command command, Selection& selection) {
+  command.addOption("PREFIX", selection.prefix, "Only keys that begin with this");
   command
-      .addOption("--day", arguments.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
+      .addOption("--day", selection.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
       .typeName("DAY");
 }
 
-}  // namespace
-
-void addStatCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("stat", "Statistics that are kept in the store");
-  const auto arguments = std::make_shared<Arguments>();
-
-  const Command import = addCommand(
-      group, "import",
-      "Import lines: scalar<TAB>DAY<TAB>KEY<TAB>INTEGER or "
-      "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
-      arguments, context,
-      [](ToolContext& tool, const Arguments& given) { importStatistics(tool, given.file); });
-  import
-      .addOption("FILE", arguments->file,
-                 "Lines to import, all or none; - is standard input (default)")
+void addImport(Command group, ToolContext& context) {
+  const auto file = std::make_shared<std::string>("-");
+  const Command import = addCommand(group, "import",
+                                    "Import lines: scalar<TAB>DAY<TAB>KEY<TAB>INTEGER or "
+                                    "value<TAB>DAY<TAB>KEY<TAB>SECONDS<TAB>DOUBLE",
+                                    file, context, importStatistics);
+  import.addOption("FILE", *file, "Lines to import, all or none; - is standard input (default)")
       .notEmpty();
   import.setFooter(
       "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar "
       "replaces\nthe one of its day. Values are added to those of their day: importing a file "
       "twice\ndoubles them.");
   context.addJsonOption(import);
+}
 
+void addExport(Command group, ToolContext& context) {
+  const auto selection = std::make_shared<Selection>();
   const Command exported =
       addCommand(group, "export", "Write the content of the store in the form that import reads",
-                 arguments, context, [](ToolContext& tool, const Arguments& given) {
-                   std::optional<std::int32_t> day;
-                   if (parseDayOption(tool, given.day, day)) {
-                     exportStatistics(tool, given.key, day);
-                   }
-                 });
-  addSelection(exported, *arguments);
+                 selection, context, showSelected<exportStatistics>);
+  addSelection(exported, *selection);
+}
 
-  addRecordCommands(group, context);
-
-  const Command listed =
-      addCommand(group, "list", "List the content of the store by day", arguments, context,
-                 [](ToolContext& tool, const Arguments& given) {
-                   std::optional<std::int32_t> day;
-                   if (parseDayOption(tool, given.day, day)) listStatistics(tool, given.key, day);
-                 });
-  addSelection(listed, *arguments);
+void addList(Command group, ToolContext& context) {
+  const auto selection = std::make_shared<Selection>();
+  const Command listed = addCommand(group, "list", "List the content of the store by day",
+                                    selection, context, showSelected<listStatistics>);
+  addSelection(listed, *selection);
   context.addJsonOption(listed);
+}
 
-  const Command folded =
-      addCommand(group, "fold", "Move what programs recorded into the store", arguments, context,
-                 [](ToolContext& tool, const Arguments&) { foldStatistics(tool); });
+void addFold(Command group, ToolContext& context) {
+  const Command folded = group.addCommand("fold", "Move what programs recorded into the store");
+  folded.onRun([&context] { foldStatistics(context); });
   context.addJsonOption(folded);
+}
 
+struct ShowArguments {
+  std::string key;
+  std::optional<std::uint32_t> days;
+};
+
+void addShow(Command group, ToolContext& context) {
+  const auto arguments = std::make_shared<ShowArguments>();
   const Command shown =
       addCommand(group, "show", "Show one statistic: its values by day, and a summary of them",
-                 arguments, context, [](ToolContext& tool, const Arguments& given) {
+                 arguments, context, [](ToolContext& tool, const ShowArguments& given) {
                    showStatistic(tool, given.key, given.days);
                  });
-  addKey(shown, *arguments);
+  shown.addOption("KEY", arguments->key, "Name of the statistic").required();
   shown.addOption("--days", arguments->days, "Only the last N days, today included (default: all)")
       .typeName("N")
-      .check(daysFault);
+      .check([](const std::string& text) { return countFault(text, "days"); });
   context.addJsonOption(shown);
+}
 
-  const Command collected = addCommand(
-      group, "collect", "Sample this machine once a second into today's statistics", arguments,
-      context, [](ToolContext& tool, const Arguments& given) {
-        if (given.once) return collectOnce(tool, given.stateFile);
-        if (given.period) {
-          return collectEvery(tool, std::chrono::seconds(*given.period), given.stateFile);
-        }
-        if (!given.stateFile.empty()) {
-          return tool.failUsage("--state needs --once or --every");
-        }
-        collectStatistics(tool, given.seconds);
-      });
+struct CollectArguments {
+  std::uint32_t seconds = 5;
+  bool once = false;
+  std::optional<std::uint32_t> period;  // seconds
+  std::string stateFile;
+};
+
+void collect(ToolContext& context, const CollectArguments& arguments) {
+  if (arguments.once) return collectOnce(context, arguments.stateFile);
+  if (arguments.period) {
+    return collectEvery(context, std::chrono::seconds(*arguments.period), arguments.stateFile);
+  }
+  if (!arguments.stateFile.empty()) return context.failUsage("--state needs --once or --every");
+  collectStatistics(context, arguments.seconds);
+}
+
+void addCollect(Command group, ToolContext& context) {
+  const auto arguments = std::make_shared<CollectArguments>();
+  const Command collected =
+      addCommand(group, "collect", "Sample this machine once a second into today's statistics",
+                 arguments, context, collect);
   const Option seconds =
       collected.addOption("--seconds", arguments->seconds, "How long to sample (default 5)")
           .typeName("N");
@@ -159,7 +131,7 @@ void addStatCommands(Command app, ToolContext& context) {
                  "Take a sample every N seconds until a signal arrives, continuing from the last "
                  "run with --every or --once")
       .typeName("N")
-      .check(periodFault)
+      .check([](const std::string& text) { return countFault(text, "seconds"); })
       .excludes(seconds)
       .excludes(once);
   collected
@@ -168,6 +140,19 @@ void addStatCommands(Command app, ToolContext& context) {
                  "/run/tavrel/collect.state)")
       .typeName("FILE");
   collected.setFooter(std::string(collectedKeysHelp()));
+}
+
+}  // namespace
+
+void addStatCommands(Command app, ToolContext& context) {
+  const Command group = app.addGroup("stat", "Statistics that are kept in the store");
+  addImport(group, context);
+  addExport(group, context);
+  addRecordCommands(group, context);
+  addList(group, context);
+  addFold(group, context);
+  addShow(group, context);
+  addCollect(group, context);
 }
 
 }  // namespace tavrel
