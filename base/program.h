@@ -1,4 +1,4 @@
-// How programs end when an exception gets as far as `main`.
+// How programs end when an exception gets as far as `main`, or when they are misused.
 #pragma once
 
 #include <cstdio>
@@ -17,6 +17,12 @@ int exitStatusOf(const char* name, Body body) noexcept {
     std::fputs(": out of memory\n", stderr);
   }
   return 1;
+}
+
+/// For an argument that the program does not take: says so and returns the exit status.
+inline int refuseArgument(const char* name, const char* argument) {
+  std::fprintf(stderr, "%s: unexpected argument '%s': see --help\n", name, argument);
+  return 2;
 }
 
 }  // namespace tavrel

@@ -52,8 +52,7 @@ int main(int argc, char** argv) {
   try {
     DeviceRoot root = DeviceRoot::fromEnvironment();
     if (const Status usable = root.check(); !usable) {
-      LinuxSystemLog().log(LogLevel::Error, "%s: name the device's folder with TAVREL_ROOT",
-                           usable.error().message);
+      LinuxSystemLog().write(LogLevel::Error, usable.error().message);
       return 0;
     }
     LinuxSystemLog systemLog;

@@ -21,15 +21,14 @@ constexpr const char* kHelp =
     "\"tavrelctl disks\" shows the readings. See tavrel-health(8).\n";
 
 // The exit status. With any other argument no drive is touched.
-int answer(std::string_view argument) {
+int answer(const char* given) {
+  const std::string_view argument = given;
   if (argument == "--help" || argument == "-h") {
     std::fputs(kHelp, stdout);
   } else if (argument == "--version") {
     std::printf("tavrel-health %s\n", std::string(version()).c_str());
   } else {
-    std::fprintf(stderr, "tavrel-health: unexpected argument '%s': see --help\n",
-                 std::string(argument).c_str());
-    return 2;
+    return refuseArgument("tavrel-health", given);
   }
   return 0;
 }
@@ -39,8 +38,7 @@ int answer(std::string_view argument) {
 int readDrives(SystemLog& log) {
   const DeviceRoot root = DeviceRoot::fromEnvironment();
   if (const Status usable = root.check(); !usable) {
-    log.log(LogLevel::Error, "%s: name the device's folder with TAVREL_ROOT",
-            usable.error().message);
+    log.write(LogLevel::Error, usable.error().message);
     return 1;
   }
   FileSystem files;

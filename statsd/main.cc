@@ -93,7 +93,7 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
         return 2;
     }
   }
-  if (optind < argc) return misuse(format("unexpected argument '%s': see --help", argv[optind]));
+  if (optind < argc) return refuseArgument("tavrel-statsd", argv[optind]);
   return std::nullopt;
 }
 

@@ -31,8 +31,7 @@ constexpr const char* kHelp =
 int upload(SystemLog& log, bool atOnce) {
   const DeviceRoot root = DeviceRoot::fromEnvironment();
   if (const Status usable = root.check(); !usable) {
-    log.log(LogLevel::Error, "%s: name the device's folder with TAVREL_ROOT",
-            usable.error().message);
+    log.write(LogLevel::Error, usable.error().message);
     return kFailed;
   }
   FileSystem files;
@@ -84,10 +83,7 @@ int run(int argc, char** argv) {
         return kMisused;
     }
   }
-  if (optind < argc) {
-    std::fprintf(stderr, "tavrel-upload: no argument '%s': see --help\n", argv[optind]);
-    return kMisused;
-  }
+  if (optind < argc) return refuseArgument("tavrel-upload", argv[optind]);
   LinuxSystemLog log;
   return loggedStatusOf(log, "upload", [&] { return upload(log, atOnce); });
 }

@@ -64,8 +64,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   for (const auto& command : {"status", "stat set k 1"}) {
     EXPECT_EQ(device.runAt(none, command),
               fails("cannot use device root " + none +
-                    "/: No such file or directory: name the device's folder with --root or "
-                    "TAVREL_ROOT"));
+                    "/: No such file or directory: name the device's folder with "
+                    "TAVREL_ROOT or --root"));
   }
   EXPECT_EQ(device.runAt("", "status"),
             fails("--root: names no folder: see 'tavrelctl status --help'", 2));

@@ -43,8 +43,7 @@ const DeviceRoot& ToolContext::root() {
     root_ = std::make_unique<DeviceRoot>(rootFolder_ ? DeviceRoot(*rootFolder_)
                                                      : DeviceRoot::fromEnvironment());
     if (const Status usable = root_->check(); !usable) {
-      throw std::runtime_error(format("%s: name the device's folder with --root or TAVREL_ROOT",
-                                      usable.error().message));
+      throw std::runtime_error(usable.error().message + " or --root");
     }
   }
   return *root_;

@@ -21,8 +21,10 @@ DeviceRoot DeviceRoot::fromEnvironment() {
 
 Status DeviceRoot::check() const {
   const std::string folder = path("/");
-  if (!FileSystem::status(folder)) return systemError("use device root", folder);
-  return Done{};
+  if (FileSystem::status(folder)) return Done{};
+  Error error = systemError("use device root", folder);
+  error.message += ": name the device's folder with TAVREL_ROOT";
+  return error;
 }
 
 std::string DeviceRoot::path(std::string_view devicePath) const {
