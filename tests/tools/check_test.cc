@@ -6,6 +6,7 @@
 #include "base/iso_date.h"
 #include "device.h"
 #include "platform/linux/runs/last_run.h"
+#include "tools/check/read_only.h"
 
 namespace tavrel {
 namespace {
@@ -186,6 +187,16 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   bytes.resize(100'000, 'x');
   device.write(store, "SQLite format 3" + bytes);
   expect("CRITICAL store: ", 2);
+}
+
+TEST(CheckReadOnly, IsOfTheFileSystemNotOfTheMount) {
+  constexpr const char* kMounts =
+      "31 1 8:2 / / ro,relatime shared:1 - ext4 /dev/sda2 rw,errors=remount-ro\n"
+      "32 31 8:3 / /var rw,relatime - ext4 /dev/sda3 ro,errors=remount-ro\n"
+      "33 31 0:9 / /run rw - tmpfs ro ro\n";
+  for (const auto& [mount, isReadOnly] :
+       {std::pair(31U, false), {32U, true}, {33U, true}, {3U, false}})
+    EXPECT_EQ(isReadOnlyIn(kMounts, mount), isReadOnly) << mount;
 }
 
 TEST_F(CheckTest, JudgesQueuesByTheirOldestLog) {

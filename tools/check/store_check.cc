@@ -9,12 +9,14 @@
 
 #include "base/format.h"
 #include "base/quantity_text.h"
+#include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/limits/device_limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "tools/check/checks.h"
+#include "tools/check/read_only.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -96,6 +98,17 @@ void checkCompanions(CheckScene& scene, const std::string& path, Check& check) {
   }
 }
 
+// After errors, the kernel makes a file system read-only: nothing is recorded or filed any more.
+void checkWritable(CheckScene& scene, const std::string& storePath, Check& check) {
+  for (const std::string& path : {storePath, scene.context.root().path("/var/lib/tavrel")}) {
+    if (!isOnReadOnlyFileSystem(path)) continue;
+    return addFinding(check, CheckState::Critical,
+                      "the file system of " + path +
+                          " is read-only: look for its errors in the kernel's log, repair it and "
+                          "mount it again");
+  }
+}
+
 }  // namespace
 
 void checkStore(CheckScene& scene) {
@@ -110,6 +123,7 @@ void checkStore(CheckScene& scene) {
   } else {
     addFinding(check, CheckState::Unknown, systemError("check", path).message);
   }
+  checkWritable(scene, path, check);
   checkCompanions(scene, path, check);
   scene.checks.push_back(std::move(check));
 }
