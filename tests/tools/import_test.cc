@@ -1,6 +1,7 @@
 #include <bit>
 #include <csignal>
 #include <regex>
+#include <sys/stat.h>
 
 #include "device.h"
 #include "tools/shared/tool_context.h"
@@ -310,6 +311,62 @@ struct PeriodicPace final : CollectPace {
   Ticks time{std::chrono::hours(1)};
 };
 
+std::string storeNote(const TemporaryDevice& device) {
+  return "tavrelctl: " + device.path("/run/tavrel/stat") +
+         ": samples go into the store, on flash, once an hour: no such folder; start "
+         "tavrel-folders.service\n";
+}
+
+// What a sampler prints that ends after some readings.
+std::string sample(const TemporaryDevice& device, const std::string& state, PeriodicPace& pace) {
+  std::istringstream in;
+  std::ostringstream out, error;
+  ToolContext context({.in = in, .out = out, .error = error});
+  context.setRoot(device.path(""));
+  collectEvery(context, std::chrono::seconds(60), state, pace);
+  return out.str() + error.str() + (context.exitStatus() == 0 ? "" : "failed");
+}
+
+TEST(StatCommands, SamplesForTheStoreWaitUntilThereIsAFolder) {
+  const TemporaryDevice device;
+  PeriodicPace pace;
+  pace.left = 62;
+  pace.between = [&] {
+    if (pace.left != 3 && pace.left != 2) return;
+    const bool isKept = exported(device).find("usage.samples=60 ") != std::string::npos;
+    EXPECT_EQ(isKept, pace.left == 2);
+    if (pace.left == 2) std::filesystem::create_directories(device.path("/run/tavrel/stat"));
+  };
+  EXPECT_EQ(sample(device, "", pace), storeNote(device) +
+                                          "tavrelctl: " + device.path("/run/tavrel/stat") +
+                                          " is there now: start again to record in memory\nfailed");
+  EXPECT_NE(exported(device).find("usage.samples=61 "), std::string::npos);
+}
+
+TEST(StatCommands, SamplesGoOnWithoutTheirStateAndWithoutASensorThatBlocks) {
+  const TemporaryDevice device;
+  device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
+  device.write("/sys/class/thermal/thermal_zone1/x", "");
+  const std::string blocked = device.path("/sys/class/thermal/thermal_zone1/temp");
+  ASSERT_EQ(mkfifo(blocked.c_str(), 0600), 0);
+  device.write("/run/full", "");
+  PeriodicPace pace;
+  pace.left = 3;
+  pace.between = [] {};
+  const std::string state = device.path("/run/full/state");
+  EXPECT_EQ(sample(device, state, pace),
+            storeNote(device) + "tavrelctl: " + blocked +
+                " does not answer within 1000 ms: left out until it does\n"
+                "tavrelctl: cannot write " +
+                state +
+                ": Not a directory; sampling goes on, but after a restart the first sample has no "
+                "rates\n");
+  const std::string all = exported(device);
+  for (const char* values :
+       {"usage.samples=3 ", "celsius=41.5 com.norvane.usage.temperature.celsius=41.5 "})
+    EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
+}
+
 TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
   const TemporaryDevice device;
   device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
@@ -329,7 +386,7 @@ TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
     collectEvery(context, std::chrono::seconds(60), "", pace);
     EXPECT_TRUE(std::filesystem::exists(state));
   }
-  EXPECT_EQ(out.str() + error.str(), "");
+  EXPECT_EQ(out.str() + error.str(), storeNote(device) + storeNote(device));
   const std::string all = exported(device);
   // The second run counts what happened between the last reading of the first run and its own.
   for (const char* values : {"usage.network.received_kib=120 ", "usage.samples=4 ",

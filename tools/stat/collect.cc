@@ -9,10 +9,13 @@
 #include <ostream>
 #include <set>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "platform/linux/files/file_system.h"
+#include "platform/system_log.h"
 #include "tools/shared/table.h"
 #include "tools/stat/collect_sources.h"
 #include "tools/stat/collect_state.h"
@@ -30,11 +33,23 @@ constexpr std::size_t kReadingsPerTransaction = 60;
 // Only the latest number of processes is kept, so most readings leave it out.
 constexpr std::uint64_t kSecondsPerCount = 60;
 
+class NotingLog final : public SystemLog {
+ public:
+  explicit NotingLog(ToolContext& context) : context_(context) {}
+  void write(LogLevel, std::string_view message) override { context_.note(message); }
+
+ private:
+  ToolContext& context_;
+};
+
 // Reads the machine, and computes values from each reading and the previous one.
 class Collector {
  public:
   Collector(ToolContext& context, ValueRecorder& recorder, std::uint64_t readingsPerCount)
-      : sources_(context.root()), recorder_(recorder), readingsPerCount_(readingsPerCount) {}
+      : log_(context),
+        sources_(context.root(), log_),
+        recorder_(recorder),
+        readingsPerCount_(readingsPerCount) {}
 
   void startFrom(std::optional<CollectState> last) { last_ = std::move(last); }
 
@@ -55,6 +70,12 @@ class Collector {
     ++waiting_;
   }
 
+  bool hasWaiting() const { return waiting_ > 0; }
+  /// Whether values wait that belong to an earlier day than the last ones.
+  bool spansDays() const {
+    return !values_.empty() && values_.front().time.day != values_.back().time.day;
+  }
+  bool isInMemory() const { return recorder_.isInMemory(); }
   /// Whether it is time to keep the values.
   bool isFull() const { return recorder_.isInMemory() || waiting_ >= kReadingsPerTransaction; }
 
@@ -111,6 +132,7 @@ class Collector {
     return Done{};
   }
 
+  NotingLog log_;
   MachineSources sources_;
   ValueRecorder& recorder_;
   const std::uint64_t readingsPerCount_;
@@ -200,8 +222,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds) {
 
 namespace {
 
-// Takes single readings; each continues from the previous reading, which
-// a file holds between runs.
+// Takes single readings; each continues from the previous reading, which a file holds between runs.
 class SingleReadings {
  public:
   SingleReadings(ToolContext& context, ValueRecorder& recorder, const std::string& stateFile)
@@ -210,7 +231,47 @@ class SingleReadings {
         boot_(bootIdentity(context.root())),
         collector_(context, recorder, 1) {}
 
-  Status take(std::chrono::nanoseconds now) {
+  void take(std::chrono::nanoseconds now) {
+    // Another process may have taken a reading since the last one was left.
+    if (!collector_.hasWaiting() && !hasLostState_) startFromState(now);
+    if (!collector_.hasWaiting()) waitingSince_ = now;
+    collector_.read(now);
+  }
+
+  /// Whether values for the store may wait for a next reading at `next`: fewer transactions are
+  /// less wear. The values of a day never wait longer than that, for the log of the day.
+  bool mayWait(std::chrono::nanoseconds next) const {
+    return !collector_.isInMemory() && !collector_.spansDays() &&
+           next - waitingSince_ < kLongestWait;
+  }
+
+  /// `goesOn`: this process takes the next reading, too, and can do so without the file.
+  Status keep(bool goesOn) {
+    if (!collector_.hasWaiting()) return Done{};
+    // Write the state first: a kill before the values are kept then loses them. In the other order,
+    // the next reading would count them twice.
+    const Status left = writeCollectState(path_, boot_, collector_.state());
+    if (!left) {
+      if (!goesOn || !removeState()) return left;
+      if (!hasLostState_) {
+        context_.note(
+            format("%s; sampling goes on, but after a restart the first sample has no rates",
+                   left.error().message));
+      }
+    }
+    hasLostState_ = !left;
+    return collector_.keep();
+  }
+
+ private:
+  static constexpr std::chrono::hours kLongestWait{1};
+
+  // From an older reading, a later process would count again what is kept now.
+  bool removeState() const {
+    return unlink(path_.c_str()) == 0 || errno == ENOENT || errno == ENOTDIR;
+  }
+
+  void startFromState(std::chrono::nanoseconds now) {
     auto before = readCollectState(path_, boot_, now);
     if (!before) {
       context_.note(format("this sample has no rates: %s", before.error().message));
@@ -218,18 +279,14 @@ class SingleReadings {
     } else {
       collector_.startFrom(std::move(*before));
     }
-    collector_.read(now);
-    // Write the state first: a kill before the values are kept then loses them. In the other order,
-    // the next reading would count them twice.
-    if (Status done = writeCollectState(path_, boot_, collector_.state()); !done) return done;
-    return collector_.keep();
   }
 
- private:
   ToolContext& context_;
   const std::string path_;
   const std::string boot_;
   Collector collector_;
+  std::chrono::nanoseconds waitingSince_{};
+  bool hasLostState_ = false;
 };
 
 }  // namespace
@@ -238,7 +295,8 @@ void collectOnce(ToolContext& context, const std::string& stateFile) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
   SingleReadings readings(context, **recorder, stateFile);
-  const Status done = readings.take(std::chrono::steady_clock::now().time_since_epoch());
+  readings.take(std::chrono::steady_clock::now().time_since_epoch());
+  const Status done = readings.keep(false);
   if (!done) context.fail(done.error().message);
 }
 
@@ -246,10 +304,29 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
                   CollectPace& pace) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
+  const std::string folder = context.root().path(kStatFolder);
+  const auto hasFolder = [&] { return FileSystem::status(folder).has_value(); };
+  const bool isInStore = !(*recorder)->isInMemory();
+  const bool lacksFolder = isInStore && !hasFolder();
+  if (isInStore) {
+    context.note(format("%s: samples go into the store, on flash, once an hour: %s", folder,
+                        lacksFolder ? "no such folder; start tavrel-folders.service"
+                                    : "not in memory; mount a tmpfs there and start again"));
+  }
   SingleReadings readings(context, **recorder, stateFile);
-  for (Ticks due = pace.now(); !pace.endsBefore(due); due = std::max(due + period, pace.now())) {
-    const Status done = readings.take(pace.now().time_since_epoch());
-    if (!done) return context.fail(done.error().message);
+  Status kept = Done{};
+  bool isReplaced = false;
+  for (Ticks due = pace.now(); kept && !isReplaced && !pace.endsBefore(due);
+       due = std::max(due + period, pace.now())) {
+    const auto now = pace.now().time_since_epoch();
+    readings.take(now);
+    if (!readings.mayWait(now + period)) kept = readings.keep(true);
+    isReplaced = lacksFolder && hasFolder();
+  }
+  if (kept) kept = readings.keep(true);
+  if (!kept) return context.fail(kept.error().message);
+  if (isReplaced) {
+    context.fail(format("%s is there now: start again to record in memory", folder));
   }
 }
 

@@ -33,6 +33,8 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds);
 void collectOnce(ToolContext& context, const std::string& stateFile);
 
 /// Does the same now and once every `period`, until `pace` ends it or values cannot be kept.
+/// Without a folder for recording in memory, says so, collects readings for the store for up to an
+/// hour, and ends with a failure when there is one.
 void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile,
                   CollectPace& pace);
 

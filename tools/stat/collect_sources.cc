@@ -11,7 +11,10 @@
 #include <sys/statvfs.h>
 #include <unistd.h>
 #include <utility>
+#include <vector>
 
+#include "base/ascii.h"
+#include "base/limits.h"
 #include "platform/linux/live/kernel_file.h"
 
 namespace tavrel {
@@ -32,13 +35,6 @@ void readAgain(const Descriptor& file, std::string& content) {
   content.resize(size);
 }
 
-std::string contentOf(const std::string& path) {
-  const Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
-  std::string content;
-  if (file) readAgain(file, content);
-  return content;
-}
-
 // Calls `take` for each name in a folder.
 template <class Take>
 void eachName(const std::string& folder, Take take) {
@@ -51,12 +47,6 @@ void eachName(const std::string& folder, Take take) {
 // Block devices that the kernel provides without hardware; there may be many.
 bool isVirtualDisk(std::string_view name) {
   return name.starts_with("loop") || name.starts_with("ram") || name.starts_with("zram");
-}
-
-std::string_view takeLine(std::string_view& text) {
-  const std::string_view line = text.substr(0, text.find('\n'));
-  text.remove_prefix(std::min(text.size(), line.size() + 1));
-  return line;
 }
 
 // The first fields of a line; only as many as are used.
@@ -96,21 +86,6 @@ std::optional<Number> firstNumber(std::string_view text) {
   return fields.empty() ? std::nullopt : numberOf<Number>(fields[0]);
 }
 
-// Thermal zones report thousandths of a degree.
-std::optional<double> readTemperature(const DeviceRoot& root) {
-  std::optional<double> hottest;
-  const std::string folder = root.pathOrMachine("/sys/class/thermal");
-  eachName(folder, [&](std::string_view name) {
-    if (!name.starts_with("thermal_zone")) return;
-    const std::string text = contentOf(folder + '/' + std::string(name) + "/temp");
-    const auto thousandths = firstNumber<std::int64_t>(text);
-    if (!thousandths) return;
-    const double celsius = static_cast<double>(*thousandths) / 1000;
-    if (!hottest || celsius > *hottest) hottest = celsius;
-  });
-  return hottest;
-}
-
 std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
   std::uint64_t count = 0;
   eachName(root.pathOrMachine("/proc"), [&](std::string_view name) {
@@ -135,11 +110,14 @@ void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
 
 }  // namespace
 
+MachineSources::MachineSources(const DeviceRoot& root, SystemLog& log)
+    : root_(root), sensors_(log, {limits::kSensorMilliseconds, limits::kSensorsMilliseconds}) {}
+
 std::string_view MachineSources::contentOf(std::string_view devicePath) {
   auto found = files_.find(devicePath);
   if (found == files_.end()) {
     const std::string path = root_.pathOrMachine(devicePath);
-    Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC));
+    Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
     if (!file) return {};
     found = files_.emplace(devicePath, std::move(file)).first;
   }
@@ -244,6 +222,28 @@ std::optional<MachineReading::Traffic> MachineSources::readDisks() {
   return traffic;
 }
 
+// Thermal zones report thousandths of a degree. A driver may keep their reader waiting for ever.
+std::optional<double> MachineSources::readTemperature() {
+  const std::string folder = root_.pathOrMachine("/sys/class/thermal");
+  std::vector<std::shared_ptr<live::SlowFile>> files;
+  eachName(folder, [&](std::string_view name) {
+    if (!name.starts_with("thermal_zone")) return;
+    auto& file = zones_[std::string(name)];
+    if (!file) {
+      file = std::make_shared<live::SlowFile>(folder + '/' + std::string(name) + "/temp", false);
+    }
+    files.push_back(file);
+  });
+  std::optional<double> hottest;
+  for (const auto& text : sensors_.read(std::move(files))) {
+    const auto thousandths = firstNumber<std::int64_t>(trimmed(text.value_or("")));
+    if (!thousandths) continue;
+    const double celsius = static_cast<double>(*thousandths) / 1000;
+    if (!hottest || celsius > *hottest) hottest = celsius;
+  }
+  return hottest;
+}
+
 MachineReading MachineSources::read(Processes processes) {
   MachineReading reading;
   reading.uptimeSeconds = firstNumber<double>(contentOf("/proc/uptime"));
@@ -253,7 +253,7 @@ MachineReading MachineSources::read(Processes processes) {
   readMemory(reading);
   reading.network = readNetwork();
   reading.disk = readDisks();
-  reading.celsius = readTemperature(root_);
+  reading.celsius = readTemperature();
   readDataFolder(root_, reading);
   return reading;
 }

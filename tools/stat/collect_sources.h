@@ -6,12 +6,14 @@
 #include <cstdint>
 #include <functional>
 #include <map>
+#include <memory>
 #include <optional>
 #include <string>
 #include <string_view>
 
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/live/slow_reads.h"
 
 namespace tavrel {
 
@@ -57,8 +59,8 @@ enum class Processes : std::uint8_t { Counted, LeftOut };
 /// open them than to read them. Files below the root replace the machine's own.
 class MachineSources {
  public:
-  /// The root must outlive it.
-  explicit MachineSources(const DeviceRoot& root) : root_(root) {}
+  /// The root and the log must outlive it. The log names sensors that do not answer.
+  MachineSources(const DeviceRoot& root, SystemLog& log);
 
   MachineReading read(Processes processes);
 
@@ -69,11 +71,14 @@ class MachineSources {
   void readMemory(MachineReading& reading);
   std::optional<MachineReading::Traffic> readNetwork();
   std::optional<MachineReading::Traffic> readDisks();
+  std::optional<double> readTemperature();
   bool isDisk(std::string_view name);
 
   const DeviceRoot& root_;
   std::map<std::string, Descriptor, std::less<>> files_;  // by path on the device
   std::map<std::string, bool, std::less<>> disks_;        // whether it is a disk, by name
+  std::map<std::string, std::shared_ptr<live::SlowFile>, std::less<>> zones_;  // by name
+  live::SlowReads sensors_;
   std::string content_;
 };
 

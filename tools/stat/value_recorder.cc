@@ -126,7 +126,7 @@ Recorders recordersOf(ToolContext& context) {
 
 Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
   const std::string root = context.root().path("");
-  const std::string folder = context.root().path("/run/tavrel/stat");
+  const std::string folder = context.root().path(kStatFolder);
   setenv("TAVREL_ROOT", root.c_str(), 1);
   // The library starts with the first lookup of a key. A key without values leaves no trace.
   BHClientScalarForKey("any");
@@ -144,7 +144,7 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
     case BHClientStatusNoSpace:
       return Error{
           format("cannot record in %s: memory or a limit of this process is exhausted: "
-                 "run 'tavrelctl stat fold'",
+                 "run 'tavrelctl stat fold' or free space in /run",
                  folder)};
     case BHClientStatusUnsupported:
       return Error{

@@ -10,11 +10,14 @@
 #include <cstdint>
 #include <memory>
 #include <string>
+#include <string_view>
 
 #include "base/expected.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {
+
+inline constexpr std::string_view kStatFolder = "/run/tavrel/stat";
 
 /// When a value was measured. Recording in memory ignores this and reads the same clock itself.
 struct ValueTime {
