@@ -16,6 +16,10 @@ constexpr bool isLetter(char c) {
   return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z');
 }
 
+constexpr bool isLetterOrDigit(char c) {
+  return isLetter(c) || isDigit(c);
+}
+
 /// The value of a hexadecimal digit.
 constexpr std::optional<unsigned> hexDigit(char c) {
   if (isDigit(c)) return static_cast<unsigned>(c - '0');

@@ -4,6 +4,7 @@
 #include <cmath>
 
 #include "base/arithmetic.h"
+#include "base/ascii.h"
 #include "client/segment_format.h"
 
 namespace tavrel {
@@ -18,9 +19,7 @@ constexpr double kMostCopies = 1000;
 constexpr const char* kFaultNames[] = {"malformed", "unsupported", "refused", "too_long"};
 
 constexpr bool isKeyCharacter(char character) {
-  return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-         (character >= '0' && character <= '9') || character == '.' || character == '_' ||
-         character == '-';
+  return isLetterOrDigit(character) || character == '.' || character == '_' || character == '-';
 }
 
 // Returns the whole part of `value` and keeps the rest in `remainder`. A sum that lies only a

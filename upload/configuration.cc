@@ -7,6 +7,7 @@
 #include <string_view>
 #include <unistd.h>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/files/property_list_file.h"
@@ -110,8 +111,7 @@ std::string takeEntry(std::string_view key, const plist::Value& value,
 // Tokens are sent unescaped in a header (RFC 6750).
 bool isToken(std::string_view text) {
   return !text.empty() && std::all_of(text.begin(), text.end(), [](char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
-           std::string_view("-._~+/=").find(c) != std::string_view::npos;
+    return isLetterOrDigit(c) || std::string_view("-._~+/=").find(c) != std::string_view::npos;
   });
 }
 

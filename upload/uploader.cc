@@ -9,6 +9,7 @@
 #include <fcntl.h>
 #include <sys/file.h>
 
+#include "base/ascii.h"
 #include "base/civil_time.h"
 #include "base/format.h"
 #include "base/iso_date.h"
@@ -38,8 +39,7 @@ double chance() {
 // Accepts only names that the system itself gives: they are safe in URLs and on the server's disk.
 bool isPlain(std::string_view name) {
   return parseLogFileName(name) && std::all_of(name.begin(), name.end(), [](char c) {
-           return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') ||
-                  c == '-' || c == '_' || c == '.';
+           return isLetterOrDigit(c) || c == '-' || c == '_' || c == '.';
          });
 }
 

@@ -7,6 +7,7 @@
 #include <string>
 
 #include "base/arithmetic.h"
+#include "base/ascii.h"
 #include "base/civil_time.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
@@ -23,8 +24,7 @@ namespace {
 void printWord(ToolContext& context, std::string_view word) {
   const bool isPlain =
       !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
-        return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-               (character >= '0' && character <= '9') ||
+        return isLetterOrDigit(character) ||
                std::string_view("._-+/@%,").find(character) != std::string_view::npos;
       });
   if (isPlain) context.out() << word << '\n';

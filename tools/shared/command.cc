@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/ascii.h"
 #include "base/parse_number.h"
 
 namespace tavrel {
@@ -15,8 +16,7 @@ namespace {
 
 // CLI11 reads 010 as octal.
 std::string withoutLeadingZeros(std::string text) {
-  const bool isDecimal =
-      std::ranges::all_of(text, [](char digit) { return digit >= '0' && digit <= '9'; });
+  const bool isDecimal = std::ranges::all_of(text, isDigit);
   if (isDecimal) text.erase(0, std::min(text.find_first_not_of('0'), text.size() - 1));
   return text;
 }

@@ -15,7 +15,7 @@ bool allDigits(std::string_view text) {
   return std::all_of(text.begin(), text.end(), isDigit);
 }
 bool lettersOrDigits(std::string_view text) {
-  return std::all_of(text.begin(), text.end(), [](char c) { return isLetter(c) || isDigit(c); });
+  return std::all_of(text.begin(), text.end(), isLetterOrDigit);
 }
 
 std::string lower(std::string_view text) {

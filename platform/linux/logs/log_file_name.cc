@@ -42,8 +42,7 @@ std::optional<std::int64_t> secondsOf(std::string_view stamp) {
 std::string plainLogName(std::string_view logName) {
   std::string part(logName.substr(0, kLongestNamePart));
   for (char& c : part) {
-    const bool isPlain = (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || isDigit(c) ||
-                         c == '-' || c == '_' || c == '.';
+    const bool isPlain = isLetterOrDigit(c) || c == '-' || c == '_' || c == '.';
     if (!isPlain) c = '_';
   }
   if (part.empty() || part[0] == '.') part.insert(0, "_");

@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/files/file_system.h"
@@ -56,8 +57,7 @@ Status removeStale(const std::string& path, const SocketAddress& address) {
 
 bool isServiceName(std::string_view name) {
   constexpr auto isAllowed = [](char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '.' ||
-           c == '-' || c == '_';
+    return isLetterOrDigit(c) || c == '.' || c == '-' || c == '_';
   };
   return !name.empty() && name.size() <= limits::kServiceNameBytes && name.front() != '.' &&
          std::all_of(name.begin(), name.end(), isAllowed);
