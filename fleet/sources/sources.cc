@@ -3,9 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstring>
-#include <dirent.h>
 #include <fcntl.h>
-#include <memory>
 #include <sys/stat.h>
 #include <utility>
 #include <vector>
@@ -16,6 +14,7 @@
 #include "fleet/sources/file_name.h"
 #include "fleet/sources/limits.h"
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/folder_walk.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -30,9 +29,8 @@ void give(const SourceSink& sink, Kind kind, std::string name, std::string reaso
   sink(std::move(item));
 }
 
-// Describes the latest system error.
-std::string cannot(std::string_view what) {
-  return format("cannot be %s: %s", what, std::strerror(errno));
+std::string cannot(std::string_view what, int code = errno) {
+  return format("cannot be %s: %s", what, std::strerror(code));
 }
 
 enum class FileType : std::uint8_t { kRegular, kFolder, kLink, kOther };
@@ -74,24 +72,19 @@ class Visit {
   Visit(const UploadLines& lines, const SourceSink& sink, const std::optional<std::string>& leftOut)
       : lines_(lines), sink_(sink), leftOut_(leftOut) {}
 
-  void folder(const std::string& path, Descriptor opened, std::size_t depth) {
-    struct Close {
-      void operator()(DIR* stream) const { closedir(stream); }
-    };
-    const std::unique_ptr<DIR, Close> stream(fdopendir(opened.get()));
-    if (!stream) return give(sink_, Kind::kRefused, path, cannot("listed"));
-    const int descriptor = opened.release();
+  void folder(const std::string& path, const Descriptor& opened, std::size_t depth) {
     std::vector<Entry> entries;
-    errno = 0;
-    while (const dirent* const entry = readdir(stream.get())) {
-      if (entry->d_name[0] != '.') entries.push_back({entry->d_name, typeOf(descriptor, *entry)});
-    }
-    if (errno != 0) give(sink_, Kind::kRefused, path, cannot("listed"));
+    const int code = walkFolder(opened, [&](const dirent& entry) {
+      if (entry.d_name[0] != '.') entries.push_back({entry.d_name, typeOf(opened.get(), entry)});
+      return true;
+    });
+    // A log whose sidecar is not seen would be filed without its metadata.
+    if (code != 0) return give(sink_, Kind::kRefused, path, cannot("listed", code));
     std::ranges::sort(entries, {}, &Entry::name);
     for (const Entry& entry : entries) {
       const std::string inner = path.ends_with('/') ? path + entry.name : path + '/' + entry.name;
       if (entry.type == FileType::kFolder) {
-        subfolder(descriptor, entry.name, inner, depth);
+        subfolder(opened.get(), entry.name, inner, depth);
       } else if (isArchiveName(entry.name)) {
         if (isRegular(entry, inner)) visitArchive(inner, lines_, sink_);
       } else if (isLogName(entry.name) && isRegular(entry, inner)) {
@@ -131,7 +124,7 @@ class Visit {
     Descriptor opened(
         openat(parent, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
     if (!opened) return give(sink_, Kind::kRefused, path, cannot("opened"));
-    if (!isLeftOut(opened)) folder(path, std::move(opened), depth + 1);
+    if (!isLeftOut(opened)) folder(path, opened, depth + 1);
   }
 
   bool isLeftOut(const Descriptor& opened) const {
@@ -156,7 +149,7 @@ void visitSources(const std::string& path, const UploadLines& lines, const Sourc
   if (S_ISDIR(status.st_mode)) {
     Descriptor opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
     if (!opened) return give(sink, Kind::kRefused, path, cannot("opened"));
-    visit.folder(path, std::move(opened), 0);
+    visit.folder(path, opened, 0);
   } else if (!S_ISREG(status.st_mode)) {
     give(sink, Kind::kRefused, path, "is not a regular file");
   } else if (isArchiveName(path)) {

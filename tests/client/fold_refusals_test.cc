@@ -2,6 +2,11 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
+#include <climits>
+#include <csignal>
+#include <dirent.h>
+#include <dlfcn.h>
 #include <fstream>
 #include <random>
 #include <sys/resource.h>
@@ -12,6 +17,17 @@
 #include "folding.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/store/sqlite_schema.h"
+
+namespace {
+int readableEntries = INT_MAX;
+}
+
+extern "C" dirent* readdir(DIR* folder) {
+  static const auto real = reinterpret_cast<dirent* (*)(DIR*)>(dlsym(RTLD_NEXT, "readdir64"));
+  if (readableEntries-- > 0) return real(folder);
+  errno = EIO;
+  return nullptr;
+}
 
 namespace tavrel {
 namespace {
@@ -353,6 +369,29 @@ TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
             "cannot open " + segments().at(0) +
                 ": Too many open files; raise the number of files that a process may open "
                 "(ulimit -n)");
+}
+
+TEST_F(FoldTest, AFolderReadInPartLosesNoPosition) {
+  pid_t children[2];
+  for (pid_t& child : children) {
+    child = start([] {
+      add(1);
+      kill(getpid(), SIGSTOP);
+    });
+    waitpid(child, nullptr, WUNTRACED);
+  }
+  EXPECT_EQ(foldNow().scalars, 2U);
+  readableEntries = 3;  // ".", ".." and one of the segments
+  const FoldReport report = foldNow();
+  readableEntries = INT_MAX;
+  EXPECT_EQ(report.failure, "cannot list " + folder.string() + ": Input/output error");
+  EXPECT_EQ(foldNow().scalars, 0U);
+  look();
+  EXPECT_EQ(scalar("count"), 2);
+  for (const pid_t child : children) {
+    kill(child, SIGKILL);
+    waitFor(child);
+  }
 }
 
 TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {

@@ -3,10 +3,8 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <dirent.h>
 #include <fcntl.h>
 #include <filesystem>
-#include <memory>
 #include <string>
 #include <sys/statvfs.h>
 #include <unistd.h>
@@ -15,6 +13,7 @@
 
 #include "base/ascii.h"
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/live/kernel_file.h"
 
 namespace tavrel {
@@ -33,15 +32,6 @@ void readAgain(const Descriptor& file, std::string& content) {
     if (got < 0 || size > kLargestFile) return content.clear();
   }
   content.resize(size);
-}
-
-// Calls `take` for each name in a folder.
-template <class Take>
-void eachName(const std::string& folder, Take take) {
-  const std::unique_ptr<DIR, int (*)(DIR*)> entries(opendir(folder.c_str()), closedir);
-  if (!entries) return;
-  while (const dirent* const entry = readdir(entries.get()))
-    take(std::string_view(entry->d_name));
 }
 
 // Block devices that the kernel provides without hardware; there may be many.
@@ -88,10 +78,12 @@ std::optional<Number> firstNumber(std::string_view text) {
 
 std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
   std::uint64_t count = 0;
-  eachName(root.pathOrMachine("/proc"), [&](std::string_view name) {
+  const int code = walkFolder(root.pathOrMachine("/proc"), [&](const dirent& entry) {
+    const std::string_view name = entry.d_name;
     if (name.find_first_not_of("0123456789") == std::string_view::npos) ++count;
+    return true;
   });
-  if (count == 0) return std::nullopt;
+  if (code != 0 || count == 0) return std::nullopt;
   return count;
 }
 
@@ -226,14 +218,15 @@ std::optional<MachineReading::Traffic> MachineSources::readDisks() {
 std::optional<double> MachineSources::readTemperature() {
   const std::string folder = root_.pathOrMachine("/sys/class/thermal");
   std::vector<std::shared_ptr<live::SlowFile>> files;
-  eachName(folder, [&](std::string_view name) {
-    if (!name.starts_with("thermal_zone")) return;
-    auto& file = zones_[std::string(name)];
-    if (!file) {
-      file = std::make_shared<live::SlowFile>(folder + '/' + std::string(name) + "/temp", false);
-    }
+  const int code = walkFolder(folder, [&](const dirent& entry) {
+    const std::string name = entry.d_name;
+    if (!name.starts_with("thermal_zone")) return true;
+    auto& file = zones_[name];
+    if (!file) file = std::make_shared<live::SlowFile>(folder + '/' + name + "/temp", false);
     files.push_back(file);
+    return true;
   });
+  if (code != 0) return std::nullopt;
   std::optional<double> hottest;
   for (const auto& text : sensors_.read(std::move(files))) {
     const auto thousandths = firstNumber<std::int64_t>(trimmed(text.value_or("")));

@@ -43,12 +43,13 @@ enum Kind {
   kFolder,
   kLock,
   kThread,
+  kListing,
   kKinds
 };
 
-static const char* const kNames[kKinds] = {"none",   "allocation", "open",  "read",     "write",
-                                           "flush",  "rename",     "map",   "truncate", "remove",
-                                           "folder", "lock",       "thread"};
+static const char* const kNames[kKinds] = {"none",   "allocation", "open",   "read",     "write",
+                                           "flush",  "rename",     "map",    "truncate", "remove",
+                                           "folder", "lock",       "thread", "listing"};
 
 enum { kLongestWait = 50 /* milliseconds */ };
 
@@ -270,6 +271,15 @@ int mkdirat(int folder, const char* path, mode_t mode) {
 int flock(int file, int operation) {
   REAL(flock)
   return fails(kLock, ENOLCK) ? -1 : real(file, operation);
+}
+
+struct dirent* readdir(DIR* folder) {
+  REAL(readdir)
+  return fails(kListing, EIO) ? NULL : real(folder);
+}
+struct dirent64* readdir64(DIR* folder) {
+  REAL(readdir64)
+  return fails(kListing, EIO) ? NULL : real(folder);
 }
 
 int pthread_create(pthread_t* thread, const pthread_attr_t* attributes, void* (*start)(void*),

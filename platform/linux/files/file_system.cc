@@ -5,7 +5,6 @@
 #include <cstdio>
 #include <dirent.h>
 #include <fcntl.h>
-#include <memory>
 #include <sys/file.h>
 #include <time.h>
 
@@ -52,8 +51,6 @@ Error cannotOpen(std::string_view what, const std::string& path) {
   if (errno != ELOOP) return systemError(what, path);
   return Error{"cannot use " + path + ": it is a symbolic link; move it away"};
 }
-
-using Folder = std::unique_ptr<DIR, decltype([](DIR* folder) { closedir(folder); })>;
 
 std::int64_t monotonicMilliseconds() {
   timespec now{};
@@ -369,15 +366,15 @@ Status FileSystem::flushFolder(const std::string& folder) {
 
 template <class IsUnwanted>
 void FileSystem::removeTemporaries(const std::string& folder, IsUnwanted isUnwanted) {
-  const Folder open(opendir(folder.c_str()));
-  if (!open) return;
-  while (const dirent* entry = readdir(open.get())) {
-    if (!isTemporary(entry->d_name)) continue;
-    const std::string path = folder + "/" + entry->d_name;
+  walkFolder(folder, [&](const dirent& entry) {
+    if (!isTemporary(entry.d_name)) return true;
+    const std::string path = folder + "/" + entry.d_name;
     struct stat found {};
-    if (lstat(path.c_str(), &found) != 0 || !S_ISREG(found.st_mode)) continue;
-    if (isUnwanted(found)) removeFile(path.c_str());
-  }
+    if (lstat(path.c_str(), &found) == 0 && S_ISREG(found.st_mode) && isUnwanted(found)) {
+      removeFile(path.c_str());
+    }
+    return true;
+  });
 }
 
 // The age is measured by the file system's own clock, from the stamp of a file made just now. The

@@ -3,10 +3,8 @@
 #include <algorithm>
 #include <cerrno>
 #include <cstdio>
-#include <dirent.h>
 #include <fcntl.h>
 #include <linux/magic.h>
-#include <memory>
 #include <random>
 #include <sys/vfs.h>
 #include <unistd.h>
@@ -14,6 +12,7 @@
 #include "base/limits.h"
 #include "base/system_text.h"
 #include "base/text.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/system_error.h"
 
@@ -23,10 +22,6 @@ namespace {
 constexpr std::string_view kFolderPath = "/run/tavrel/stat";
 constexpr const char* kRequest = "fold-wanted";
 constexpr std::string_view kSegmentEnding = ".segment";
-
-struct CloseFolder {
-  void operator()(DIR* folder) const { closedir(folder); }
-};
 
 // Whether opening a file failed for a reason other than the file itself.
 bool isSystemsFailure(int code) {
@@ -103,16 +98,12 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
       listing.refusals.push_back(refusal(name, reason));
     }
   };
-  Descriptor opened(openat(folder_.get(), ".", O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-  const std::unique_ptr<DIR, CloseFolder> folder(opened ? fdopendir(opened.get()) : nullptr);
-  if (!folder) return systemError("list", path_);
-  opened.release();
   std::minstd_rand random(std::random_device{}());
   std::map<std::uint32_t, Sample<std::string>> byOwner;
   std::size_t entries = 0;
-  while (const dirent* const entry = readdir(folder.get())) {
-    const std::string_view name = entry->d_name;
-    if (name == "." || name == ".." || name == kRequest) continue;
+  const int code = walkFolder(folder_, [&](const dirent& entry) {
+    const std::string_view name = entry.d_name;
+    if (name == kRequest) return true;
     if (++entries > mostFiles) {
       // At the front, because only the first lines are logged.
       listing.refusals.insert(listing.refusals.begin(),
@@ -120,22 +111,28 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
                                   " files: the rest is not folded; remove files that are not "
                                   "segments");
       listing.isWhole = false;
-      break;
+      return false;
     }
     if (!name.ends_with(kSegmentEnding)) {
       refuse(name, "not the name of a segment");
-      continue;
+      return true;
     }
     struct stat status {};
-    if (fstatat(folder_.get(), entry->d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) continue;
+    if (fstatat(folder_.get(), entry.d_name, &status, AT_SYMLINK_NOFOLLOW) != 0) {
+      if (errno != ENOENT) listing.isWhole = false;
+      return true;
+    }
     if (const char* const fault = faultOf(status, device_)) {
       refuse(name, fault);
       if (S_ISREG(status.st_mode)) listing.linked.insert(status.st_uid);
-      continue;
+      return true;
     }
     byOwner.try_emplace(status.st_uid, limits::kSegmentsPerUser)
         .first->second.offer(std::string(name), random);
-  }
+    return true;
+  });
+  // What is not seen would pass for gone.
+  if (code != 0) return systemError("list", path_, code);
   Sample<SegmentEntry> all(limits::kSegments);
   std::map<std::uint32_t, std::uint64_t> chosen;
   for (auto& [owner, names] : byOwner) {

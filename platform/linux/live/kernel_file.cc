@@ -2,13 +2,13 @@
 
 #include <algorithm>
 #include <climits>
-#include <dirent.h>
 #include <fcntl.h>
 #include <memory>
 #include <sys/resource.h>
 #include <sys/stat.h>
 
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 
 namespace tavrel::live {
 namespace {
@@ -94,12 +94,10 @@ std::string firstLine(const std::string& path) {
 
 std::vector<std::string> namesIn(const std::string& folder) {
   std::vector<std::string> names;
-  const std::unique_ptr<DIR, int (*)(DIR*)> stream(opendir(folder.c_str()), closedir);
-  if (!stream) return names;
-  while (const dirent* entry = readdir(stream.get())) {
-    const std::string_view name = entry->d_name;
-    if (name != "." && name != "..") names.emplace_back(name);
-  }
+  walkFolder(folder, [&names](const dirent& entry) {
+    names.emplace_back(entry.d_name);
+    return true;
+  });
   std::sort(names.begin(), names.end());
   return names;
 }

@@ -2,12 +2,11 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <dirent.h>
-#include <memory>
 #include <utility>
 
 #include "base/civil_time.h"
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/stamp.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/logs/log_file_name.h"
@@ -207,18 +206,15 @@ Status FileSubmission::checkPermission() const {
 // folder.
 Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
   const std::string path = folder(place);
-  const std::unique_ptr<DIR, int (*)(DIR*)> open(opendir(path.c_str()), closedir);
   Files files;
-  if (!open && errno == ENOENT) return files;
-  if (!open) return systemError("list", path);
-  errno = 0;
-  while (const dirent* entry = readdir(open.get())) {
-    const std::string_view name = entry->d_name;
-    if (name[0] == '.') continue;
+  const int code = walkFolder(path, [&files](const dirent& entry) {
+    const std::string_view name = entry.d_name;
+    if (name[0] == '.') return true;
     files.logs += name.ends_with(kLogEnding) ? 1U : 0U;
     files.metadata += name.ends_with(kLogMetadataEnding) ? 1U : 0U;
-  }
-  if (errno != 0) return systemError("list", path);
+    return true;
+  });
+  if (code != 0 && code != ENOENT) return systemError("list", path, code);
   return files;
 }
 
