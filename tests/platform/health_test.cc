@@ -222,6 +222,7 @@ class Answers final : public DeviceCommands {
  public:
   Expected<Bytes> nvmeLog(const std::string& path, std::uint8_t page) override {
     asked.push_back(path.substr(path.rfind('/') + 1) + (page == kNvmeSmartLog ? " 02" : " C0"));
+    if (const auto now = std::exchange(whileAsked, nullptr)) now();
     const auto& answer = page == kNvmeSmartLog ? smart : ocp;
     if (!answer) return Error{"NVMe status 0x4002"};
     if (path.find(killer) != path.npos) throw std::bad_alloc();
@@ -233,6 +234,7 @@ class Answers final : public DeviceCommands {
   std::optional<Bytes> smart = smartPage(), ocp = Bytes{};
   std::string killer = "none";  // the drive that kills the reader
   std::vector<std::string> asked;
+  std::function<void()> whileAsked;
 };
 
 // Accepts readings, which are in memory, but no file on flash.
@@ -327,6 +329,58 @@ TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
   EXPECT_FALSE(valuesOf(readings()["nvme0"].figures).contains("media_written"));
   const std::string memory = contentOf(root.path(kMemoryFile));
   EXPECT_EQ(decodeMemory(asBytes(memory))->drives.size(), 2U) << "drives of one serial number";
+}
+
+// Counts what is written, a line for each file.
+class CountedFiles final : public FileSystem {
+  int renameFile(const char* from, const char* to) override {
+    ++written[to];
+    return FileSystem::renameFile(from, to);
+  }
+
+ public:
+  std::map<std::string, int> written;
+};
+
+TEST_F(HealthReaderTest, FlashThatNeedsNoCommandCostsOneWriting) {
+  addNvme("nvme0", "S1");
+  for (const char* name : {"mtd0", "mtd1", "mtd2"})
+    write(std::string("/sys/class/mtd/") + name + "/ecc_failures", "2\n");
+  CountedFiles counted;
+  ASSERT_TRUE(HealthReader(root, counted, answers, log).readAll(1000));
+  EXPECT_EQ(counted.written[root.path(kMemoryFile)], 2);
+  EXPECT_EQ(counted.written.size(), 5U);
+}
+
+TEST_F(HealthReaderTest, ADriveThatIsBeingReadKeepsNoOtherWaiting) {
+  addNvme("nvme0", "S1");
+  addNvme("nvme1", "S2");
+  const auto stuck = files.lockFile(root.path("/run/tavrel/health/.nvme0.lock"));
+  EXPECT_FALSE(readAll(1000));
+  EXPECT_EQ(readings().size(), 1U);
+  EXPECT_EQ(readings()["nvme1"].time, 1000);
+  EXPECT_EQ(log.lines, (Lines{"no health of nvme0: cannot lock " +
+                              root.path("/run/tavrel/health/.nvme0.lock") +
+                              ": another process has it locked; it is reading the drive, which is "
+                              "defective if that never ends"}));
+}
+
+TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
+  addNvme("nvme0", "S1");
+  addNvme("nvme1", "S2");
+  run(1);
+  ASSERT_TRUE(readAll(1000));
+  run(2);
+  answers.whileAsked = [this] {
+    run(3);
+    put(*answers.smart, 48, {4});
+    EXPECT_FALSE(readAll(3000)) << "nvme0 is being read";
+  };
+  ASSERT_TRUE(readAll(2000));
+  EXPECT_EQ(readings()["nvme0"].time, 2000);
+  EXPECT_EQ(readings()["nvme1"].time, 3000);
+  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 2 * 512'000);
+  EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 2 * 512'000);
 }
 
 TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {

@@ -327,8 +327,12 @@ Status FileSystem::lock(int descriptor, const std::string& path, const LockPatie
     if (errno == EINTR) continue;
     if (errno != EWOULDBLOCK) return systemError("lock", path);
     if (monotonicMilliseconds() > end) {
-      return Error{"cannot lock " + path + ": another process has had it locked for " +
-                   std::to_string(patience.milliseconds / 1000) + " seconds; " +
+      const std::string held = patience.milliseconds == 0
+                                   ? "has it locked; "
+                                   : "has had it locked for " +
+                                         std::to_string(patience.milliseconds / 1000) +
+                                         " seconds; ";
+      return Error{"cannot lock " + path + ": another process " + held +
                    std::string(patience.advice)};
     }
     constexpr timespec kPause{0, 2'000'000};

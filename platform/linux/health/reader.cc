@@ -1,8 +1,8 @@
 #include "platform/linux/health/reader.h"
 
 #include <algorithm>
-#include <set>
 #include <sys/stat.h>
+#include <utility>
 
 #include "base/format.h"
 #include "base/limits.h"
@@ -18,6 +18,15 @@
 
 namespace tavrel::health {
 namespace {
+
+// A reading waits for no other, since processes stuck in a drive would collect.
+constexpr LockPatience kDrivePatience{
+    0, "it is reading the drive, which is defective if that never ends"};
+
+// Whether the kernel has all figures of a drive in memory and sends it no command.
+bool isInMemory(const Drive& drive) {
+  return drive.kind == DriveKind::Mtd || drive.kind == DriveKind::Ubi;
+}
 
 // Whether a reading would wake a drive that must go on sleeping. The kernel suspends cards whenever
 // they are idle, so any write wakes them; figures of raw flash are in the kernel's memory.
@@ -93,30 +102,30 @@ Reading readWithoutCommands(const Drive& drive) {
   return reading;
 }
 
-void HealthReader::readNvme(const Drive& drive, Memory& memory, Reading& reading) {
+void HealthReader::readNvme(const Drive& drive, Reading& reading) {
   const auto page = commands_.nvmeLog(drive.deviceFile, kNvmeSmartLog);
   take(page ? nvmeSmartFigures(*page) : page.error(), "log 02h", reading);
   if (!page) return;
   const std::string key = drive.model + '/' + drive.firmware;
-  const auto known = memory.hasOcpLog.find(key);
+  const auto known = memory_.hasOcpLog.find(key);
   // A drive that lacks the log counts each request for it as an error.
-  if (known != memory.hasOcpLog.end() && !known->second) return;
+  if (known != memory_.hasOcpLog.end() && !known->second) return;
   const auto ocpPage = commands_.nvmeLog(drive.deviceFile, kNvmeOcpLog);
   if (!ocpPage) return;  // no answer
   const auto ocp = nvmeOcpFigures(*ocpPage);
-  if (known == memory.hasOcpLog.end()) memory.hasOcpLog[key] = static_cast<bool>(ocp);
+  if (known == memory_.hasOcpLog.end()) memory_.hasOcpLog[key] = static_cast<bool>(ocp);
   if (!ocp) return;
   reading.figures.insert(reading.figures.end(), ocp->begin(), ocp->end());
   appendNvmeDerived(reading.figures);
   reading.from += ", log C0h";
 }
 
-Reading HealthReader::readDrive(const Drive& drive, Memory& memory, bool& isDriveAsleep) {
+Reading HealthReader::readDrive(const Drive& drive, bool& isDriveAsleep) {
   isDriveAsleep = isLeftAsleep(drive);
   Reading reading = emptyReading(drive);
   if (isDriveAsleep) return reading;
   if (drive.kind == DriveKind::Nvme) {
-    readNvme(drive, memory, reading);
+    readNvme(drive, reading);
   } else if (drive.kind == DriveKind::Ata) {
     const auto blob = commands_.ataSmart(drive.deviceFile);
     isDriveAsleep = blob && blob->empty();
@@ -132,15 +141,38 @@ Reading HealthReader::readDrive(const Drive& drive, Memory& memory, bool& isDriv
   return reading;
 }
 
-Memory HealthReader::loadMemory() {
+std::string HealthReader::lockPath(std::string_view name) const {
+  return root_.path(format("%s/%s.lock", kReadingsFolder, name));
+}
+
+Expected<Descriptor> HealthReader::lockMemory() {
+  auto lock = files_.lockFile(lockPath(""));
+  if (lock) {
+    refreshMemory();
+  } else {
+    log_.log(LogLevel::Error, "readings have no growth: %s", lock.error().message);
+  }
+  return lock;
+}
+
+// When another run has written the memory since, because a drive kept this one waiting, that run
+// has read the other drives.
+void HealthReader::refreshMemory() {
   const std::string path = root_.path(kMemoryFile);
   const auto content = files_.readIfPresent(path, limits::kHealthMemoryBytes);
-  if (content && !*content) return {};
-  auto memory = content ? decodeMemory(asBytes(**content)) : Expected<Memory>(content.error());
-  if (memory) return std::move(*memory);
-  log_.log(LogLevel::Error, "cannot use remembered counters %s, starting again: %s", path,
-           memory.error().message);
-  return {};
+  const auto found = content ? *content : std::optional(content.error().message);
+  if (found == memoryFile_) return;
+  memoryFile_ = found;
+  isSuperseded_ = true;
+  auto memory = !content   ? Expected<Memory>(content.error())
+                : *content ? decodeMemory(asBytes(**content))
+                           : Memory();
+  if (!memory) {
+    log_.log(LogLevel::Error, "cannot use remembered counters %s, starting again: %s", path,
+             memory.error().message);
+  }
+  auto learned = std::exchange(memory_, memory ? *std::move(memory) : Memory()).hasOcpLog;
+  memory_.hasOcpLog.merge(learned);
 }
 
 // Growth counts from the reading that the last daily run saw, so it restarts when the daemon's last
@@ -167,11 +199,12 @@ bool HealthReader::write(const Reading& reading) {
   return static_cast<bool>(written);
 }
 
-bool HealthReader::keep(const Memory& memory) {
-  const auto document = encodeMemory(memory);
+bool HealthReader::keep() {
+  const auto document = encodeMemory(memory_);
   const Status kept = document ? files_.replace(root_.path(kMemoryFile), asBytes(*document), 0600)
                                : Status(document.error());
   if (!kept) log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
+  if (kept) memoryFile_ = *document;
   return static_cast<bool>(kept);
 }
 
@@ -190,8 +223,53 @@ bool HealthReader::removeGone(const std::vector<Drive>& drives) {
   return true;
 }
 
+// Reads drives and then stores once what is remembered of them.
+bool HealthReader::read(std::span<const Drive> drives) {
+  bool isDone = true;
+  std::vector<std::pair<std::string, Reading>> taken;  // with the identity of the drive
+  for (const Drive& drive : drives) {
+    std::string identity = identityOf(drive);
+    // Only its name tells a drive from another of the same serial number.
+    if (!identities_.insert(identity).second) identity += '/' + drive.name;
+    // A process that waits for a drive which never answers cannot even be killed.
+    const auto lock = isInMemory(drive)
+                          ? Descriptor()
+                          : files_.lockFile(lockPath('.' + drive.name), kDrivePatience);
+    if (!lock) {
+      log_.log(LogLevel::Error, "no health of %s: %s", drive.name, lock.error().message);
+      isDone = false;
+      continue;
+    }
+    bool isDriveAsleep = false;
+    Reading reading = readDrive(drive, isDriveAsleep);
+    if (isDriveAsleep) continue;
+    reading.time = moment_.seconds;
+    reading.boot = moment_.boot;
+    if (!reading.error.empty()) {
+      log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
+    }
+    taken.emplace_back(std::move(identity), std::move(reading));
+  }
+  if (taken.empty()) return isDone;
+  const auto lock = lockMemory();
+  bool hasGrowth = false;
+  for (auto& [identity, reading] : taken) {
+    if (!reading.error.empty() || !hasRunDay_ || !lock) continue;
+    reading.growth = takeGrowth(memory_.drives[identity], reading.figures, moment_);
+    hasGrowth = true;
+  }
+  // Store the memory before anybody sees the growth, or the next run would count it again: the
+  // next drive may never answer.
+  const bool isKept = lock && (!hasGrowth || keep());
+  for (auto& [identity, reading] : taken) {
+    if (!isKept) reading.growth.clear();
+    isDone = write(reading) && isDone;
+  }
+  return isKept && isDone;
+}
+
 bool HealthReader::readAll(std::int64_t nowSeconds) {
-  const auto drives = findDrives(Machine(root_));
+  auto drives = findDrives(Machine(root_));
   if (!drives) {
     log_.log(LogLevel::Error, "cannot look for drives: %s", drives.error().message);
     return false;
@@ -200,34 +278,22 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   if (!runDay) {
     log_.log(LogLevel::Error, "readings have no growth: %s", runDay.error().message);
   }
-  const Moment moment{nowSeconds, bootIDOf(root_), runDay ? *runDay : std::nullopt};
-  Memory memory = loadMemory();
-  bool isDone = static_cast<bool>(runDay);
-  std::set<std::string> identities;
-  for (const Drive& drive : *drives) {
-    std::string identity = identityOf(drive);
-    // Only its name tells a drive from another of the same serial number.
-    if (!identities.insert(identity).second) identity += '/' + drive.name;
-    bool isDriveAsleep = false;
-    Reading reading = readDrive(drive, memory, isDriveAsleep);
-    if (isDriveAsleep) continue;
-    reading.time = moment.seconds;
-    reading.boot = moment.boot;
-    if (!reading.error.empty()) {
-      log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
-    } else if (runDay) {
-      reading.growth = takeGrowth(memory.drives[identity], reading.figures, moment);
-      // Store the memory before anybody sees the growth, or the next run would count it again: the
-      // next drive may never answer.
-      if (!keep(memory)) {
-        reading.growth.clear();
-        isDone = false;
-      }
-    }
-    isDone = write(reading) && isDone;
-  }
+  hasRunDay_ = static_cast<bool>(runDay);
+  moment_ = {nowSeconds, bootIDOf(root_), runDay ? *runDay : std::nullopt};
+  bool isDone = hasRunDay_;
+  refreshMemory();
+  isSuperseded_ = false;
+  // Without commands first, and together: each writing of the memory costs flushes of the flash.
+  const auto others = std::ranges::stable_partition(*drives, isInMemory);
+  isDone = read({drives->begin(), others.begin()}) && isDone;
+  for (auto drive = others.begin(); drive != others.end() && !isSuperseded_; ++drive)
+    isDone = read({drive, 1}) && isDone;
   // Last, because a drive that was just read is not old, whatever the clock showed before.
-  if (memory.forgetOld(moment.seconds)) isDone = keep(memory) && isDone;
+  if (memory_.forgetOld(moment_.seconds)) {
+    const auto lock = lockMemory();
+    memory_.forgetOld(moment_.seconds);
+    isDone = lock && keep() && isDone;
+  }
   return removeGone(*drives) && isDone;
 }
 

@@ -2,7 +2,11 @@
 #pragma once
 
 #include <optional>
+#include <set>
+#include <span>
+#include <string>
 #include <string_view>
+#include <vector>
 
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
@@ -29,22 +33,34 @@ class HealthReader {
 
   /// False when drives could not be listed, or a reading or the memory could not be written. A
   /// sleeping drive keeps its earlier reading, the reading of a drive that has gone is removed, and
-  /// the reading of a drive that cannot be read says why.
+  /// the reading of a drive that cannot be read says why. A drive that another process is reading
+  /// keeps its earlier reading, too; the answer is then false.
   bool readAll(std::int64_t nowSeconds);
 
  private:
-  Memory loadMemory();
+  std::string lockPath(std::string_view name) const;
+  /// Makes `memory_` what is stored now.
+  void refreshMemory();
+  /// The same, and keeps other runs from changing it.
+  Expected<Descriptor> lockMemory();
   Expected<std::optional<std::int64_t>> lastRunDay();
-  Reading readDrive(const Drive& drive, Memory& memory, bool& isAsleep);
-  void readNvme(const Drive& drive, Memory& memory, Reading& reading);
+  bool read(std::span<const Drive> drives);
+  Reading readDrive(const Drive& drive, bool& isAsleep);
+  void readNvme(const Drive& drive, Reading& reading);
   bool write(const Reading& reading);
-  bool keep(const Memory& memory);
+  bool keep();
   bool removeGone(const std::vector<Drive>& drives);
 
   const DeviceRoot& root_;
   FileSystem& files_;
   DeviceCommands& commands_;
   SystemLog& log_;
+  Moment moment_;
+  bool hasRunDay_ = false;
+  Memory memory_;
+  std::optional<std::string> memoryFile_;  // when last read or written; or why it is unreadable
+  bool isSuperseded_ = false;              // another run has written the memory meanwhile
+  std::set<std::string> identities_;       // of the drives looked at
 };
 
 }  // namespace tavrel::health
