@@ -1,6 +1,7 @@
 // Integer arithmetic whose result is defined for every argument.
 #pragma once
 
+#include <concepts>
 #include <cstdint>
 #include <limits>
 #include <optional>
@@ -13,6 +14,14 @@ constexpr std::int64_t wrappingAdd(std::int64_t a, std::int64_t b) {
 }
 constexpr std::int64_t wrappingSubtract(std::int64_t a, std::int64_t b) {
   return static_cast<std::int64_t>(static_cast<std::uint64_t>(a) - static_cast<std::uint64_t>(b));
+}
+
+/// The sum, or the number next to it that the type holds.
+template <std::integral Number>
+constexpr Number saturatingAdd(Number a, Number b) {
+  Number sum{};
+  if (!__builtin_add_overflow(a, b, &sum)) return sum;
+  return b < 0 ? std::numeric_limits<Number>::min() : std::numeric_limits<Number>::max();
 }
 
 /// The previous day, in two's complement: the last 32-bit day precedes the first one.

@@ -4,6 +4,8 @@
 #include <iterator>
 #include <limits>
 
+#include "base/arithmetic.h"
+
 namespace tavrel::fleet {
 
 namespace {
@@ -15,8 +17,7 @@ constexpr double kInfinity = std::numeric_limits<double>::infinity();
 constexpr std::size_t kMostClasses = 64;
 
 void addTo(std::uint64_t& sum, std::uint64_t count) {
-  constexpr auto kMost = std::numeric_limits<std::uint64_t>::max();
-  sum = count > kMost - sum ? kMost : sum + count;
+  sum = saturatingAdd(sum, count);
 }
 
 }  // namespace

@@ -1,8 +1,8 @@
 #include "fleet/questions/merged_numbers.h"
 
-#include <algorithm>
 #include <cmath>
-#include <limits>
+
+#include "base/arithmetic.h"
 
 namespace tavrel::fleet {
 
@@ -28,8 +28,7 @@ void MergedNumbers::add(const FiveNumbers& numbers) {
     maximum_ = numbers.maximum;
   }
   isEmpty_ = false;
-  constexpr auto kMost = std::numeric_limits<std::uint64_t>::max();
-  count_ += std::min(numbers.count, kMost - count_);
+  count_ = saturatingAdd(count_, numbers.count);
   if (hasMean(numbers)) {
     moments_.add(numbers.mean, numbers.squaredDeviations, numbers.count);
   } else {

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <limits>
 
+#include "base/arithmetic.h"
 #include "fleet/questions/cell_classes.h"
 #include "fleet/questions/day_range.h"
 #include "fleet/questions/exact_moments.h"
@@ -157,7 +158,7 @@ class SideAnswer {
     for (const auto& [log, cell] : rows_.cells) {
       if (partOf_[log] == sets.size()) continue;
       classes[partOf_[log]].add(log, cell);
-      if (cell.lower < cell.upper) told[log] += cell.count;
+      if (cell.lower < cell.upper) told[log] = saturatingAdd(told[log], cell.count);
     }
     // Values that no histogram counts may lie anywhere. Without them, the histogram would cover
     // other logs than the five numbers do.

@@ -38,6 +38,9 @@ TEST(Bytes, StoresWhollyOrNotAtAll) {
 
 TEST(Arithmetic, IsDefinedAtTheEnds) {
   EXPECT_EQ(wrappingAdd(INT64_MAX, 1), INT64_MIN);
+  EXPECT_EQ(saturatingAdd(INT64_MAX, std::int64_t{1}), INT64_MAX);
+  EXPECT_EQ(saturatingAdd(INT64_MIN, std::int64_t{-1}), INT64_MIN);
+  EXPECT_EQ(saturatingAdd(kMax64 - 1, std::uint64_t{2}), kMax64);
   EXPECT_EQ(previousDay(INT32_MIN), INT32_MAX);
   EXPECT_EQ(shiftLeft(1, 64), 0U);
   constexpr std::uint64_t kTwoTo32 = std::uint64_t{1} << 32;

@@ -108,6 +108,22 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
                   Interval{-kInfinity, kInfinity}, Interval{-kInfinity, kInfinity}));
 }
 
+TEST(ShowTest, InventsNoValuesWhereCountsExceed64Bits) {
+  TestFleet fleet;
+  for (int device = 0; device < 5; ++device) {
+    LogRecord& record = fleet.add(1, "OS 1");
+    record.distributions = {{"d", {0, 3, 1, 1, 5}}};
+    record.cells = {{"d", 0, 1, "(0, 1]", INT64_MAX},
+                    {"d", 1, 2, "(1, 2]", INT64_MAX},
+                    {"d", 2, 3, "(2, 3]", 2}};
+  }
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 5);
+  const ShowAnswer answer =
+      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
+  EXPECT_EQ(answer.sides[0].whole.histogram.pieces.front().lower, 0);
+}
+
 TEST(ShowTest, TellsNoMeanOfFewDevices) {
   TestFleet fleet;
   for (int device = 0; device < 30; ++device) {
