@@ -122,6 +122,13 @@ bool LogBuilder::addRow() {
   return fail(format("the log has more than %zu rows", limits::kLogRows));
 }
 
+// Whether the next value may be anything. Only a text is read as BHTaskID.
+bool LogBuilder::isIgnored() const {
+  const Place place = levels_.back().place;
+  return place == Place::kSkipped ||
+         (place == Place::kRoot && (member_ == Member::kTaskID || member_ == Member::kUnknown));
+}
+
 // Checks that property lists allow a value here.
 bool LogBuilder::takeValue() {
   if (levels_.empty()) {
@@ -138,6 +145,12 @@ bool LogBuilder::takeValue() {
   }
   level.hasKey = false;
   return true;
+}
+
+// The same for a value that is no container.
+bool LogBuilder::takeSingleValue(std::string_view kind) {
+  if (!takeValue()) return false;
+  return !levels_.empty() || fail(format("is not a tallied log: it is %s", kind));
 }
 
 bool LogBuilder::key(std::string_view text) {
@@ -190,44 +203,49 @@ bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
     inner = Place::kRoot;
     return isDictionary || fail("is not a tallied log: it is an array");
   }
-  const auto dictionary = [&](Place place) {
-    inner = place;
-    return isDictionary || wrongType();
-  };
+  if (isIgnored()) return true;
+  return levels_.back().place == Place::kRoot ? beginRootMember(isDictionary, inner)
+                                              : beginEntry(isDictionary, inner);
+}
+
+bool LogBuilder::beginRootMember(bool isDictionary, Place& inner) {
+  switch (member_) {
+    case Member::kMetadata:
+      inner = Place::kMetadata;
+      break;
+    case Member::kScalars:
+      inner = Place::kScalars;
+      break;
+    case Member::kDistributions:
+      inner = Place::kDistributions;
+      break;
+    case Member::kHistograms:
+      inner = Place::kHistograms;
+      break;
+    case Member::kApplications:
+      inner = Place::kApplications;
+      return !isDictionary || wrongType();
+    default:
+      return wrongType();
+  }
+  return isDictionary || wrongType();
+}
+
+bool LogBuilder::beginEntry(bool isDictionary, Place& inner) {
   switch (levels_.back().place) {
-    case Place::kRoot:
-      entry_ = inner_ = {};
-      switch (member_) {
-        case Member::kMetadata:
-          return dictionary(Place::kMetadata);
-        case Member::kScalars:
-          return dictionary(Place::kScalars);
-        case Member::kDistributions:
-          return dictionary(Place::kDistributions);
-        case Member::kHistograms:
-          return dictionary(Place::kHistograms);
-        case Member::kApplications:
-          inner = Place::kApplications;
-          return !isDictionary || wrongType();
-        case Member::kTaskID:
-        case Member::kUnknown:
-          return true;
-        default:
-          return wrongType();
-      }
     case Place::kDistributions:
       inner = Place::kNumbers;
       numberCount_ = 0;
       return !isDictionary || wrongType();
     case Place::kHistograms:
-      inner_ = {};
-      return dictionary(Place::kCells);
+      inner = Place::kCells;
+      return isDictionary || wrongType();
     case Place::kApplications:
       if (!addRow()) return false;
       record_.applications.emplace_back();
-      return dictionary(Place::kApplication);
+      inner = Place::kApplication;
+      return isDictionary || wrongType();
     case Place::kScalars:
-      return wrongType();
     case Place::kNumbers:
     case Place::kCells:
       return wrongType();
@@ -276,26 +294,15 @@ bool LogBuilder::addCell(const plist::Number& count) {
   return true;
 }
 
-bool LogBuilder::rootInteger(const plist::Number& number) {
-  switch (member_) {
-    case Member::kVersion:
-      if (number.kind() != plist::NumberKind::UInt64 && number.int64() == 1) return true;
-      return fail("is a version that this program does not know");
-    case Member::kTaskID:
-    case Member::kUnknown:
-      return true;
-    default:
-      return wrongType();
-  }
-}
-
 bool LogBuilder::integer(const plist::Number& number) {
-  if (!takeValue()) return false;
-  if (levels_.empty()) return fail("is not a tallied log: it is a number");
+  if (!takeSingleValue("a number")) return false;
+  if (isIgnored()) return true;
   const bool isLarge = number.kind() == plist::NumberKind::UInt64;
   switch (levels_.back().place) {
     case Place::kRoot:
-      return rootInteger(number);
+      if (member_ != Member::kVersion) return wrongType();
+      return (!isLarge && number.int64() == 1) ||
+             fail("is a version that this program does not know");
     case Place::kScalars:
       if (isLarge) return fail("exceeds 64 bits with a sign");
       if (!addRow()) return false;
@@ -314,7 +321,6 @@ bool LogBuilder::integer(const plist::Number& number) {
       if (inner_ == "arch") record_.applications.back().arch = number.int64();
       return true;
     case Place::kDistributions:
-      return wrongType();
     case Place::kHistograms:
     case Place::kApplications:
       return wrongType();
@@ -324,40 +330,18 @@ bool LogBuilder::integer(const plist::Number& number) {
 }
 
 bool LogBuilder::real(double number) {
-  if (!takeValue()) return false;
-  if (levels_.empty()) return fail("is not a tallied log: it is a number");
-  switch (levels_.back().place) {
-    case Place::kNumbers:
-      return addNumber(number);
-    case Place::kSkipped:
-      return true;
-    case Place::kRoot:
-      if (member_ == Member::kTaskID || member_ == Member::kUnknown) return true;
-      [[fallthrough]];
-    default:
-      return wrongType();
-  }
-}
-
-bool LogBuilder::rootString(std::string_view text) {
-  switch (member_) {
-    case Member::kTaskID:
-      return keepText(text, record_.taskID);
-    case Member::kWhitelistDigest:
-      return keepText(text, record_.whitelistDigest);
-    case Member::kUnknown:
-      return true;
-    default:
-      return wrongType();
-  }
+  if (!takeSingleValue("a number")) return false;
+  if (isIgnored()) return true;
+  return levels_.back().place == Place::kNumbers ? addNumber(number) : wrongType();
 }
 
 bool LogBuilder::string(std::string_view text) {
-  if (!takeValue()) return false;
-  if (levels_.empty()) return fail("is not a tallied log: it is a text");
+  if (!takeSingleValue("a text")) return false;
   switch (levels_.back().place) {
     case Place::kRoot:
-      return rootString(text);
+      if (member_ == Member::kTaskID) return keepText(text, record_.taskID);
+      if (member_ == Member::kWhitelistDigest) return keepText(text, record_.whitelistDigest);
+      return isIgnored() || wrongType();
     case Place::kMetadata:
       if (inner_ == "BHUserInterfaceLanguage") return keepText(text, record_.language);
       if (inner_ == "BHPreferredUserInterfaceLanguage") {
@@ -370,21 +354,15 @@ bool LogBuilder::string(std::string_view text) {
       if (inner_ == "version") return keepText(text, application.version);
       return inner_ != "uuid" || keepText(text, application.uuid);
     }
-    case Place::kSkipped:
-      return true;
     default:
-      return wrongType();
+      return isIgnored() || wrongType();
   }
 }
 
 bool LogBuilder::date(plist::Date date) {
-  if (!takeValue()) return false;
-  if (levels_.empty()) return fail("is not a tallied log: it is a date");
-  const Place place = levels_.back().place;
-  if (place == Place::kSkipped || (place == Place::kRoot && member_ == Member::kUnknown)) {
-    return true;
-  }
-  if (place != Place::kRoot ||
+  if (!takeSingleValue("a date")) return false;
+  if (isIgnored()) return true;
+  if (levels_.back().place != Place::kRoot ||
       (member_ != Member::kStartDate && member_ != Member::kCreationDate)) {
     return wrongType();
   }
@@ -400,14 +378,7 @@ bool LogBuilder::date(plist::Date date) {
 }
 
 bool LogBuilder::other() {
-  if (!takeValue()) return false;
-  if (levels_.empty()) return fail("is not a tallied log: it is a single value");
-  const Place place = levels_.back().place;
-  if (place == Place::kSkipped ||
-      (place == Place::kRoot && (member_ == Member::kTaskID || member_ == Member::kUnknown))) {
-    return true;
-  }
-  return wrongType();
+  return takeSingleValue("a single value") && (isIgnored() || wrongType());
 }
 
 bool LogBuilder::finish() {

@@ -61,14 +61,16 @@ class LogBuilder {
   };
   enum class Member : std::uint8_t;
 
+  bool isIgnored() const;
   bool takeValue();
+  bool takeSingleValue(std::string_view kind);
   bool beginIn(bool isDictionary, Place& inner);
+  bool beginRootMember(bool isDictionary, Place& inner);
+  bool beginEntry(bool isDictionary, Place& inner);
   bool endNumbers();
   bool addRow();
   bool addCell(const plist::Number& count);
   bool addNumber(double number);
-  bool rootInteger(const plist::Number& number);
-  bool rootString(std::string_view text);
   bool wrongType();
   bool keepText(std::string_view text, std::string_view& to);
   std::string path() const;

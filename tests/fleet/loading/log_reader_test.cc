@@ -244,6 +244,14 @@ TEST(LogReaderTest, TakesWhatValuesCanGive) {
   }
 }
 
+TEST(LogReaderTest, TakesATaskIDOfAnyType) {
+  for (const char* const value : {"<date>2026-11-24T00:00:00Z</date>", "<real>1</real>", "<true/>",
+                                  "<integer>1</integer>", "<array><true/></array>", "<dict/>"}) {
+    const std::string log = changed(kSampleLog, "<string>(no tasking id)</string>", value);
+    EXPECT_EQ(faultIn(log), "none") << value;
+  }
+}
+
 TEST(LogReaderTest, RefusesWhatIsNoWholeDocument) {
   EXPECT_EQ(faultIn(""), "is empty");
   EXPECT_EQ(faultIn("{\"BHScalars\": {}}"), "is not a property list");
