@@ -1,14 +1,13 @@
 #include "upload/connection.h"
 
 #include <algorithm>
-#include <array>
 #include <curl/curl.h>
+#include <memory>
 #include <new>
-#include <stdexcept>
 
-#include "base/format.h"
 #include "base/limits.h"
 #include "base/version.h"
+#include "http/curl_handle.h"
 
 namespace tavrel::upload {
 namespace {
@@ -16,25 +15,30 @@ namespace {
 // bytes a second, below which a transfer counts as stalled
 constexpr long kSlowest = 100;
 
-template <class Argument>
-void set(CURL* handle, CURLoption option, Argument argument) {
-  const CURLcode code = curl_easy_setopt(handle, option, argument);
-  if (code == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
-  // Deadlines and the restriction to TLS are among the options, so none may fail silently.
-  if (code != CURLE_OK) {
-    throw std::runtime_error(format("libcurl refuses option %d: %s", static_cast<int>(option),
-                                    curl_easy_strerror(code)));
-  }
-}
-
 void setText(CURL* handle, CURLoption option, const std::string& text) {
-  if (!text.empty()) set(handle, option, text.c_str());
+  if (!text.empty()) setOption(handle, option, text.c_str());
 }
 
 std::string headerOf(CURL* handle, const char* name) {
   curl_header* header = nullptr;
   if (curl_easy_header(handle, name, 0, CURLH_HEADER, -1, &header) != CURLHE_OK) return {};
   return header->value;
+}
+
+CurlHandle newHandle(const CurlShare& share, const Configuration& configuration) {
+  CurlHandle owned = newCurlHandle(share, configuration.mayBePlain ? "https,http" : "https",
+                                   configuration.authority);
+  CURL* const handle = owned.get();
+  // Do not wait for a name look-up that hangs.
+  setOption(handle, CURLOPT_QUICK_EXIT, 1L);
+  setText(handle, CURLOPT_SSLCERT, configuration.certificate);
+  setText(handle, CURLOPT_SSLKEY, configuration.key);
+  setOption(handle, CURLOPT_KEYPASSWD, "");  // do not ask for it on a terminal
+  setOption(handle, CURLOPT_CONNECTTIMEOUT, static_cast<long>(configuration.connect.count()));
+  setOption(handle, CURLOPT_LOW_SPEED_LIMIT, kSlowest);
+  setOption(handle, CURLOPT_LOW_SPEED_TIME, static_cast<long>(configuration.stall.count()));
+  setOption(handle, CURLOPT_USERAGENT, ("tavrel-upload/" + std::string(version())).c_str());
+  return owned;
 }
 
 }  // namespace
@@ -62,37 +66,6 @@ struct Connection::Transfer {
 
 Connection::Connection(const Configuration& configuration) : configuration_(configuration) {}
 
-Connection::Handle Connection::newHandle() const {
-  const Configuration& configuration = configuration_;
-  Handle owned(curl_easy_init(), curl_easy_cleanup);
-  CURL* const handle = owned.get();
-  if (handle == nullptr) throw std::bad_alloc();
-  set(handle, CURLOPT_SHARE, shared_.get());
-  // Do not wait for a name look-up that hangs.
-  set(handle, CURLOPT_QUICK_EXIT, 1L);
-  set(handle, CURLOPT_PROTOCOLS_STR, configuration.mayBePlain ? "https,http" : "https");
-  set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
-  set(handle, CURLOPT_FOLLOWLOCATION, 0L);
-  set(handle, CURLOPT_PROXY, "");
-  set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
-  if (!configuration.authority.empty()) {
-    set(handle, CURLOPT_CAINFO, configuration.authority.c_str());
-    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // do not trust the system's as well
-  }
-  setText(handle, CURLOPT_SSLCERT, configuration.certificate);
-  setText(handle, CURLOPT_SSLKEY, configuration.key);
-  set(handle, CURLOPT_KEYPASSWD, "");  // do not ask for it on a terminal
-  set(handle, CURLOPT_CONNECTTIMEOUT, static_cast<long>(configuration.connect.count()));
-  set(handle, CURLOPT_LOW_SPEED_LIMIT, kSlowest);
-  set(handle, CURLOPT_LOW_SPEED_TIME, static_cast<long>(configuration.stall.count()));
-  set(handle, CURLOPT_USERAGENT, ("tavrel-upload/" + std::string(version())).c_str());
-  set(handle, CURLOPT_CUSTOMREQUEST, "PUT");
-  set(handle, CURLOPT_WRITEFUNCTION, Transfer::takeBody);
-  set(handle, CURLOPT_XFERINFOFUNCTION, Transfer::progress);
-  set(handle, CURLOPT_NOPROGRESS, 0L);
-  return owned;
-}
-
 Expected<Answer> Connection::put(const std::string& url, const std::vector<std::string>& headers,
                                  std::string_view body, std::chrono::milliseconds longest,
                                  const GoOn& goOn) {
@@ -111,21 +84,25 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
     add(header);
 
   Transfer transfer{goOn, std::chrono::steady_clock::now()};
-  std::array<char, CURL_ERROR_SIZE> words{};
-  const Handle owned = newHandle();
+  CurlErrorText words{};
+  const CurlHandle owned = newHandle(shared_, configuration_);
   CURL* const handle = owned.get();
-  set(handle, CURLOPT_URL, url.c_str());
-  set(handle, CURLOPT_HTTPHEADER, list.get());
-  set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
-  set(handle, CURLOPT_POSTFIELDS, body.data());
-  set(handle, CURLOPT_TIMEOUT_MS, static_cast<long>(longest.count()));
-  set(handle, CURLOPT_WRITEDATA, &transfer);
-  set(handle, CURLOPT_XFERINFODATA, &transfer);
-  set(handle, CURLOPT_ERRORBUFFER, words.data());
+  setOption(handle, CURLOPT_URL, url.c_str());
+  setOption(handle, CURLOPT_CUSTOMREQUEST, "PUT");
+  setOption(handle, CURLOPT_HTTPHEADER, list.get());
+  setOption(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
+  setOption(handle, CURLOPT_POSTFIELDS, body.data());
+  setOption(handle, CURLOPT_TIMEOUT_MS, static_cast<long>(longest.count()));
+  setOption(handle, CURLOPT_WRITEFUNCTION, Transfer::takeBody);
+  setOption(handle, CURLOPT_WRITEDATA, &transfer);
+  setOption(handle, CURLOPT_XFERINFOFUNCTION, Transfer::progress);
+  setOption(handle, CURLOPT_XFERINFODATA, &transfer);
+  setOption(handle, CURLOPT_NOPROGRESS, 0L);
+  setOption(handle, CURLOPT_ERRORBUFFER, words.data());
   const CURLcode code = curl_easy_perform(handle);
   isMisconfigured_ = code == CURLE_SSL_CERTPROBLEM || code == CURLE_SSL_CACERT_BADFILE;
   if (transfer.answerBytes > limits::kUploadAnswerBytes) return Error{"the answer is too long"};
-  if (code != CURLE_OK) return Error{words[0] != '\0' ? words.data() : curl_easy_strerror(code)};
+  if (code != CURLE_OK) return Error{curlFailure(code, words)};
 
   Answer answer;
   curl_off_t seconds = 0;

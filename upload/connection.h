@@ -4,7 +4,6 @@
 #include <chrono>
 #include <cstdint>
 #include <functional>
-#include <memory>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -46,8 +45,6 @@ class Connection {
 
  private:
   struct Transfer;
-  using Handle = std::unique_ptr<void, void (*)(void*)>;
-  Handle newHandle() const;
 
   const Configuration& configuration_;
   CurlShare shared_;

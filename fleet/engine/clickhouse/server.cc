@@ -8,6 +8,8 @@
 #include <new>
 #include <thread>
 
+#include "http/curl_handle.h"
+
 namespace tavrel::fleet {
 namespace {
 
@@ -23,11 +25,6 @@ constexpr const char* kAnswerBytes = "33554432";
 // Codes of transient conditions: time exceeded, too many queries, network trouble between servers,
 // too many parts waiting to be merged, no replica or shard reachable.
 constexpr std::array kPassingCodes = {159, 202, 203, 209, 210, 252, 279};
-
-template <class Argument>
-void set(CURL* handle, CURLoption option, Argument argument) {
-  if (curl_easy_setopt(handle, option, argument) == CURLE_OUT_OF_MEMORY) throw std::bad_alloc();
-}
 
 std::string encoded(std::string_view text) {
   char* const out = curl_easy_escape(nullptr, text.data(), static_cast<int>(text.size()));
@@ -68,6 +65,21 @@ std::string reasonIn(std::string_view answer) {
   return reason;
 }
 
+CurlHandle newHandle(const CurlShare& share, const ServerAddress& address) {
+  CurlHandle owned = newCurlHandle(share, "http,https", address.authorityFile);
+  CURL* const handle = owned.get();
+  setOption(handle, CURLOPT_NOSIGNAL, 1L);
+  if (!address.user.empty()) {
+    setOption(handle, CURLOPT_HTTPAUTH, static_cast<long>(CURLAUTH_BASIC));
+    setOption(handle, CURLOPT_USERNAME, address.user.c_str());
+    setOption(handle, CURLOPT_PASSWORD, address.password.c_str());
+  }
+  setOption(handle, CURLOPT_CONNECTTIMEOUT, kConnectSeconds);
+  setOption(handle, CURLOPT_TIMEOUT, static_cast<long>(address.timeout.count()));
+  setOption(handle, CURLOPT_BUFFERSIZE, kReceiveBytes);
+  return owned;
+}
+
 }  // namespace
 
 // The context of one transfer's callback.
@@ -100,34 +112,6 @@ struct Server::Transfer {
 
 Server::Server(ServerAddress address) : address_(std::move(address)) {}
 
-Server::Handle Server::newHandle() const {
-  Handle owned(curl_easy_init(), curl_easy_cleanup);
-  CURL* const handle = owned.get();
-  if (handle == nullptr) throw std::bad_alloc();
-  set(handle, CURLOPT_SHARE, shared_.get());
-  set(handle, CURLOPT_NOSIGNAL, 1L);
-  set(handle, CURLOPT_PROTOCOLS_STR, "http,https");
-  set(handle, CURLOPT_HTTP_VERSION, static_cast<long>(CURL_HTTP_VERSION_1_1));
-  set(handle, CURLOPT_FOLLOWLOCATION, 0L);
-  set(handle, CURLOPT_PROXY, "");
-  set(handle, CURLOPT_SSLVERSION, static_cast<long>(CURL_SSLVERSION_TLSv1_2));
-  if (!address_.authorityFile.empty()) {
-    set(handle, CURLOPT_CAINFO, address_.authorityFile.c_str());
-    set(handle, CURLOPT_CAPATH, static_cast<char*>(nullptr));  // do not trust the system's as well
-  }
-  if (!address_.user.empty()) {
-    set(handle, CURLOPT_HTTPAUTH, static_cast<long>(CURLAUTH_BASIC));
-    set(handle, CURLOPT_USERNAME, address_.user.c_str());
-    set(handle, CURLOPT_PASSWORD, address_.password.c_str());
-  }
-  set(handle, CURLOPT_CONNECTTIMEOUT, kConnectSeconds);
-  set(handle, CURLOPT_TIMEOUT, static_cast<long>(address_.timeout.count()));
-  set(handle, CURLOPT_POST, 1L);
-  set(handle, CURLOPT_BUFFERSIZE, kReceiveBytes);
-  set(handle, CURLOPT_WRITEFUNCTION, Transfer::receive);
-  return owned;
-}
-
 // With wait_end_of_query the server sends nothing before the statement has ended. Otherwise it
 // would append a late failure to the rows of an answer that began as a success.
 std::string Server::urlWith(const std::string& statement) const {
@@ -155,23 +139,24 @@ void Server::refuse(std::string_view answer, long status) const {
 
 void Server::perform(const std::string& url, std::string_view body, bool isRepeatable,
                      const std::function<void(std::string_view)>& take) {
-  std::array<char, CURL_ERROR_SIZE> words{};
-  const Handle owned = newHandle();
+  CurlErrorText words{};
+  const CurlHandle owned = newHandle(shared_, address_);
   CURL* const handle = owned.get();
   Transfer transfer{handle, take, {}, {}};
-  set(handle, CURLOPT_URL, url.c_str());
-  set(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
-  set(handle, CURLOPT_POSTFIELDS, body.data());
-  set(handle, CURLOPT_WRITEDATA, &transfer);
-  set(handle, CURLOPT_ERRORBUFFER, words.data());
+  setOption(handle, CURLOPT_URL, url.c_str());
+  setOption(handle, CURLOPT_POST, 1L);
+  setOption(handle, CURLOPT_POSTFIELDSIZE_LARGE, static_cast<curl_off_t>(body.size()));
+  setOption(handle, CURLOPT_POSTFIELDS, body.data());
+  setOption(handle, CURLOPT_WRITEFUNCTION, Transfer::receive);
+  setOption(handle, CURLOPT_WRITEDATA, &transfer);
+  setOption(handle, CURLOPT_ERRORBUFFER, words.data());
   // On a reused connection, libcurl itself repeats a request that gets no answer, so
   // rows get a fresh connection.
-  set(handle, CURLOPT_FRESH_CONNECT, isRepeatable ? 0L : 1L);
+  setOption(handle, CURLOPT_FRESH_CONNECT, isRepeatable ? 0L : 1L);
   const CURLcode code = curl_easy_perform(handle);
   if (transfer.failure) std::rethrow_exception(transfer.failure);
   if (code != CURLE_OK) {
-    const std::string text =
-        address_.name + ": " + (words[0] != '\0' ? words.data() : curl_easy_strerror(code));
+    const std::string text = address_.name + ": " + curlFailure(code, words);
     if (transfer.handedOut) throw EngineError(text + ": the answer is incomplete; try again");
     throw PassingError(text + ": check that the server runs and can be reached, and try again");
   }

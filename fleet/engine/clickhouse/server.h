@@ -3,7 +3,6 @@
 
 #include <cstdint>
 #include <functional>
-#include <memory>
 #include <string>
 #include <string_view>
 
@@ -52,9 +51,7 @@ class Server {
 
  private:
   struct Transfer;
-  using Handle = std::unique_ptr<void, void (*)(void*)>;
 
-  Handle newHandle() const;
   void perform(const std::string& url, std::string_view body, bool isRepeatable,
                const std::function<void(std::string_view)>& take);
   std::string urlWith(const std::string& statement) const;
