@@ -2,13 +2,13 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <cstring>
 #include <fcntl.h>
 #include <sys/stat.h>
 #include <utility>
 #include <vector>
 
 #include "base/format.h"
+#include "base/system_text.h"
 #include "fleet/logs/limits.h"
 #include "fleet/sources/archive_source.h"
 #include "fleet/sources/file_name.h"
@@ -30,7 +30,7 @@ void give(const SourceSink& sink, Kind kind, std::string name, std::string reaso
 }
 
 std::string cannot(std::string_view what, int code = errno) {
-  return format("cannot be %s: %s", what, std::strerror(code));
+  return format("cannot be %s: %s", what, systemText(code));
 }
 
 enum class FileType : std::uint8_t { kRegular, kFolder, kLink, kOther };

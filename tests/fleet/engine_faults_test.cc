@@ -2,6 +2,7 @@
 #include <chrono>
 #include <gmock/gmock.h>
 #include <sqlite3.h>
+#include <sys/stat.h>
 #include <thread>
 
 #include "fleet/engine/open/open_engine.h"
@@ -93,7 +94,11 @@ TEST(EngineFaults, LeavesFilesAloneThatAreNotItsOwn) {
   EXPECT_EQ(openingFailure(path, OpenMode::kRead),
             path + ": there is no database: load logs into it first");
   EXPECT_FALSE(std::filesystem::exists(path));
-  EXPECT_THAT(openingFailure(root.root.path("/")), HasSubstr(": cannot be read: name a file"));
+  ASSERT_EQ(mkfifo(root.root.path("/pipe").c_str(), 0600), 0);
+  for (const char* const name : {"/", "/pipe"}) {
+    const std::string other = root.root.path(name);
+    EXPECT_EQ(openingFailure(other), other + ": is not a regular file: name another file");
+  }
   EXPECT_THAT(openingFailure(root.root.path("/no/file")),
               HasSubstr("/no/file: unable to open database file (No such file or directory): check "
                         "owner and permissions of the file and its folder"));
@@ -158,8 +163,15 @@ TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
       {"clickhouse://h/d?a=b", "has the unknown option \"a\""}};
   for (const auto& [address, failure] : cases)
     EXPECT_EQ(openingFailure(address), "the database's address " + failure + advice) << address;
-  EXPECT_THAT(openingFailure("clickhouse://h/d?password-file=" + root.root.path("/long")),
-              HasSubstr("/long: cannot be read as a password"));
+  ASSERT_EQ(mkfifo(root.root.path("/pipe").c_str(), 0600), 0);
+  const std::pair<const char*, const char*> passwords[] = {
+      {"/long", ": has more than 4096 bytes: name a file that holds only a password"},
+      {"/pipe", ": is not a regular file: name another file"},
+      {"/none", ": there is no such file: name the password's"}};
+  for (const auto& [name, failure] : passwords) {
+    const std::string path = root.root.path(name);
+    EXPECT_EQ(openingFailure("clickhouse://h/d?password-file=" + path), path + failure);
+  }
 }
 
 TEST(EngineFaults, TellsWhatTheServerSays) {

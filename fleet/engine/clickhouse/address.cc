@@ -2,19 +2,19 @@
 
 #include <algorithm>
 #include <curl/curl.h>
-#include <fstream>
-#include <iterator>
 #include <memory>
+#include <utility>
 
 #include "base/parse_number.h"
 #include "fleet/engine/engine.h"
+#include "fleet/engine/regular_file.h"
 
 namespace tavrel::fleet {
 namespace {
 
 constexpr std::string_view kPlain = "clickhouse://";
 constexpr std::string_view kEncrypted = "clickhouses://";
-constexpr std::streamsize kLongestPassword = 4096;
+constexpr std::size_t kLongestPassword = 4096;
 constexpr int kLongestTimeout = 86'400;
 constexpr int kMostRetries = 20;
 
@@ -44,15 +44,15 @@ void checkName(const std::string& what, std::string_view name) {
 }
 
 std::string passwordIn(const std::string& path) {
-  std::ifstream file(path, std::ios::binary);
-  std::string password(kLongestPassword + 1, '\0');
-  file.read(password.data(), kLongestPassword + 1);
-  if (!file.is_open() || file.bad() || file.gcount() > kLongestPassword)
-    throw EngineError(path + ": cannot be read as a password: check that you may read the file");
-  password.resize(static_cast<std::size_t>(file.gcount()));
-  while (!password.empty() && (password.back() == '\n' || password.back() == '\r'))
-    password.pop_back();
-  return password;
+  auto password = readBeginning(path, kLongestPassword + 1);
+  if (!password) throw EngineError(path + ": there is no such file: name the password's");
+  if (password->size() > kLongestPassword) {
+    throw EngineError(path + ": has more than " + std::to_string(kLongestPassword) +
+                      " bytes: name a file that holds only a password");
+  }
+  while (password->ends_with('\n') || password->ends_with('\r'))
+    password->pop_back();
+  return *std::move(password);
 }
 
 int numberIn(const std::string& name, std::string_view text, int lowest, int highest) {

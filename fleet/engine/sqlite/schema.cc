@@ -1,13 +1,11 @@
 #include "fleet/engine/sqlite/schema.h"
 
-#include <array>
-#include <cerrno>
 #include <cstdint>
-#include <cstring>
-#include <fstream>
 #include <string_view>
 
+#include "base/bytes.h"
 #include "fleet/engine/engine.h"
+#include "fleet/engine/regular_file.h"
 #include "fleet/engine/sqlite/row_id.h"
 
 namespace tavrel::fleet {
@@ -71,9 +69,12 @@ CREATE VIEW applications AS
 
 enum class Found { kNothing, kDatabase };
 
-std::uint32_t word(const std::array<unsigned char, 100>& header, std::size_t at) {
-  return std::uint32_t{header[at]} << 24 | std::uint32_t{header[at + 1]} << 16 |
-         std::uint32_t{header[at + 2]} << 8 | header[at + 3];
+constexpr std::string_view kMagic("SQLite format 3\0", 16);
+constexpr std::size_t kHeaderBytes = 100;
+
+// The header's numbers are big-endian.
+std::uint32_t word(ByteSpan header, std::size_t at) {
+  return __builtin_bswap32(loadLittle32(header, at).value_or(0));
 }
 
 void checkVersion(const std::string& path, std::int64_t version) {
@@ -86,24 +87,14 @@ void checkVersion(const std::string& path, std::int64_t version) {
 // Reads the file's header as bytes: merely by opening another program's file, SQLite would complete
 // or roll back its changes.
 Found look(const std::string& path) {
-  std::array<unsigned char, 100> header{};
-  errno = 0;
-  std::ifstream file(path, std::ios::binary);
-  if (!file.is_open()) {
-    if (errno == ENOENT) return Found::kNothing;
-    throw EngineError(path + ": " + std::strerror(errno) +
-                      ": check owner and permissions of the file and its folder");
-  }
-  file.read(reinterpret_cast<char*>(header.data()), header.size());
-  if (file.bad() || (file.gcount() == 0 && errno == EISDIR))
-    throw EngineError(path + ": cannot be read: name a file");
-  if (file.gcount() == 0) return Found::kNothing;
-  static constexpr std::string_view kMagic("SQLite format 3\0", 16);
-  if (file.gcount() < 100 || std::memcmp(header.data(), kMagic.data(), kMagic.size()) != 0)
+  const auto header = readBeginning(path, kHeaderBytes);
+  if (!header || header->empty()) return Found::kNothing;
+  const auto bytes = asBytes(*header);
+  if (bytes.size() < kHeaderBytes || !header->starts_with(kMagic))
     throw EngineError(path + ": is not a database: name another file");
-  if (word(header, 68) != kApplicationId)
+  if (word(bytes, 68) != kApplicationId)
     throw EngineError(path + ": is another program's database: name another file");
-  checkVersion(path, word(header, 60));
+  checkVersion(path, word(bytes, 60));
   return Found::kDatabase;
 }
 
