@@ -1,7 +1,10 @@
 #include "fleet/questions/ledger.h"
 
 #include <algorithm>
+#include <optional>
 #include <utility>
+
+#include "fleet/questions/crossing.h"
 
 namespace tavrel::fleet {
 
@@ -32,7 +35,7 @@ bool Ledger::leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& 
   return rest.empty() || hasEnough(rest);
 }
 
-void Ledger::noteShown(const std::string& subject, const LogSet& logs) {
+std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, const LogSet& logs) {
   std::shared_ptr<const LogSet> kept;
   const std::size_t hash = logs.hash();
   const auto [first, last] = known_.equal_range(hash);
@@ -44,7 +47,26 @@ void Ledger::noteShown(const std::string& subject, const LogSet& logs) {
     known_.emplace(hash, kept);
   }
   auto& sets = shown_[subject];
-  if (std::find(sets.begin(), sets.end(), kept) == sets.end()) sets.push_back(std::move(kept));
+  if (std::find(sets.begin(), sets.end(), kept) == sets.end()) sets.push_back(kept);
+  return kept;
+}
+
+void Ledger::noteDivision(const std::string& subject, const LogSet& whole,
+                          const std::vector<const LogSet*>& parts) {
+  Parts noted{noteShown(subject, whole), {}};
+  for (const LogSet* part : parts)
+    noted.parts.push_back(noteShown(subject, *part));
+  divisions_[subject].push_back(std::move(noted));
+}
+
+std::vector<Ledger::Sets> Ledger::divisionsOf(const std::string& subject,
+                                              const LogSet& whole) const {
+  std::vector<Sets> result;
+  const auto found = divisions_.find(subject);
+  if (found == divisions_.end()) return result;
+  for (const Parts& division : found->second)
+    if (*division.whole == whole) result.push_back(division.parts);
+  return result;
 }
 
 std::string subjectOf(KeyKind kind, const std::string& key) {
@@ -80,25 +102,49 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
     return a.isAllowed != b.isAllowed ? b.isAllowed : a.devices < b.devices;
   });
 
-  LogSet other(table);
-  std::size_t joined = 0;
-  while (joined < parts.size() &&
-         (!parts[joined].isAllowed || (joined != 0 && !ledger.allows(subject, other)))) {
-    const Group& group = groups[parts[joined++].position];
-    other.add(group.logs);
-    division.joined += group.values;
-  }
-  if (joined == parts.size()) return division;
+  std::vector<std::size_t> order;
+  for (const Part& part : parts)
+    order.push_back(part.position);
+  std::vector<const LogSet*> sets;
+  for (const Group& group : groups)
+    sets.push_back(&group.logs);
+  std::vector<Crossing> crossings;
+  for (const Ledger::Sets& earlier : ledger.divisionsOf(subject, division.whole))
+    crossings.emplace_back(table, sets, earlier, ledger.devicesAtLeast());
 
+  LogSet other(table);
   std::vector<bool> isJoined(groups.size());
-  for (std::size_t i = 0; i < joined; ++i)
-    isJoined[parts[i].position] = true;
+  std::size_t joined = 0;
+  const auto join = [&](std::size_t position) {
+    isJoined[position] = true;
+    ++joined;
+    other.add(groups[position].logs);
+    division.joined += groups[position].values;
+  };
+  for (const Part& part : parts)
+    if (!part.isAllowed) join(part.position);
+  const auto groupToJoin = [&]() -> std::optional<std::size_t> {
+    if (joined != 0 && !ledger.allows(subject, other))
+      return *std::ranges::find(order, false, [&](std::size_t i) { return isJoined[i]; });
+    for (const Crossing& crossing : crossings)
+      if (const auto group = crossing.groupToJoin(isJoined, order)) return group;
+    return std::nullopt;
+  };
+  while (joined < groups.size()) {
+    const auto group = groupToJoin();
+    if (!group) break;
+    join(*group);
+  }
+  if (joined == groups.size()) return division;
+
   for (std::size_t i = 0; i < groups.size(); ++i) {
     if (!isJoined[i]) division.groups.push_back(std::move(groups[i]));
   }
   if (joined != 0) division.groups.push_back({{PartKind::kOther}, std::move(other)});
+  sets.clear();
   for (const Group& group : division.groups)
-    ledger.noteShown(subject, group.logs);
+    sets.push_back(&group.logs);
+  ledger.noteDivision(subject, division.whole, sets);
   return division;
 }
 

@@ -33,11 +33,17 @@ class Ledger {
   /// subject or differs from it by enough devices; and subtracting all shown parts, from it or from
   /// a shown set that includes it, leaves either nothing or enough devices.
   bool allows(const std::string& subject, const LogSet& logs) const;
-  void noteShown(const std::string& subject, const LogSet& logs);
+  std::shared_ptr<const LogSet> noteShown(const std::string& subject, const LogSet& logs);
 
   using Sets = std::vector<std::shared_ptr<const LogSet>>;
   using Shown = std::map<std::string, Sets>;
   const Shown& shown() const { return shown_; }
+
+  /// Notes the parts of a whole as shown.
+  void noteDivision(const std::string& subject, const LogSet& whole,
+                    const std::vector<const LogSet*>& parts);
+  /// The divisions of the whole that were noted.
+  std::vector<Sets> divisionsOf(const std::string& subject, const LogSet& whole) const;
 
  private:
   /// Whether the whole, without those of its parts that are already shown or to be shown, is
@@ -47,6 +53,11 @@ class Ledger {
   const LogTable& table_;
   const std::size_t devicesAtLeast_;
   Shown shown_;
+  struct Parts {
+    std::shared_ptr<const LogSet> whole;
+    Sets parts;
+  };
+  std::map<std::string, std::vector<Parts>> divisions_;
   // Many subjects have the same sets.
   std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;
 };
@@ -75,7 +86,9 @@ struct Division {
 /// Divides the union of the groups, which share no log, into parts that may be shown, and notes the
 /// parts and the whole as shown. Joins groups of too few devices, and as many of the smallest
 /// others as it takes for what remains of the whole without the shown groups to have enough
-/// devices, too. Drops empty groups; a whole that cannot be divided has no groups.
+/// devices, too, and for sums of groups of an earlier division of the same whole to differ from
+/// sums of these by nothing or enough devices. Drops empty groups; a whole that cannot be divided
+/// has no groups.
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups);
 
 }  // namespace tavrel::fleet

@@ -168,7 +168,7 @@ void expectNothingSmallFollows(const Ledger& ledger) {
         EXPECT_TRUE(devices == 0 || devices >= ledger.devicesAtLeast()) << subject << devices;
       }
     }
-    if (subject == "logs") continue;  // it has several groupings
+    if (subject == "logs") continue;  // it has several divisions
     std::map<std::vector<bool>, LogSet> cells;
     for (LogIndex log = 0; log < table.size(); ++log) {
       std::vector<bool> in;
@@ -180,6 +180,76 @@ void expectNothingSmallFollows(const Ledger& ledger) {
     for (const auto& [in, logs] : cells)
       EXPECT_TRUE(ledger.hasEnough(logs)) << subject;
   }
+}
+
+/// Checks each union of groups of one division less all groups of another that it includes. A
+/// union that groups of the other include is the rest of such a union.
+void expectNothingSmallFollowsFromTwo(const std::vector<Division>& divisions,
+                                      const Ledger& ledger) {
+  for (const Division& one : divisions) {
+    for (const Division& other : divisions) {
+      if (&one == &other || one.groups.size() > 10) continue;
+      for (std::size_t choice = 0; choice < std::size_t{1} << one.groups.size(); ++choice) {
+        LogSet rest(ledger.table());
+        for (std::size_t i = 0; i < one.groups.size(); ++i)
+          if ((choice >> i & 1) != 0) rest.add(one.groups[i].logs);
+        for (const Group& group : other.groups)
+          if (rest.includes(group.logs)) rest = rest.without(group.logs);
+        EXPECT_TRUE(rest.empty() || ledger.hasEnough(rest)) << choice;
+      }
+    }
+  }
+}
+
+std::vector<Division> divisionsOf(Ledger& ledger) {
+  std::vector<Division> divisions;
+  for (const GroupBy by : {GroupBy::kOs, GroupBy::kRegion, GroupBy::kDigest, GroupBy::kDay})
+    divisions.push_back(
+        divide(ledger, "logs",
+               groupsOf(ledger.table(), logsOn(ledger.table(), {}), by, ledger.devicesAtLeast())));
+  return divisions;
+}
+
+TEST(PrivacyTest, NothingSmallFollowsFromTwoDivisions) {
+  TestFleet fleet;
+  for (int device = 0; device < 100; ++device)
+    fleet.add(1, "1",
+              device < 50   ? "DE"
+              : device < 75 ? "FR"
+                            : "US")
+        .whitelistDigest = device < 25                                   ? "d3"
+                           : device < 50 || device == 60 || device >= 98 ? "d2"
+                                                                         : "d1";
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 10);
+  const SummaryAnswer answer = summarise(fleet.engine(), ledger, {});
+  EXPECT_THAT(titles(answer.parts[1].groups), ElementsAre("DE 50/50", "FR 25/25", "US 25/25"));
+  // d1 is FR and US without three logs.
+  EXPECT_THAT(titles(answer.parts[2].groups), ElementsAre("d2 28/28", "(other) 72/72"));
+  EXPECT_EQ(answer.parts[2].joined, 2u);
+
+  std::minstd_rand random(7);
+  std::size_t groups = 0;
+  for (int turn = 0; turn < 300; ++turn) {
+    TestFleet any;
+    const auto noise = 1 + random() % 40;
+    const auto regions = 2 + random() % 5;
+    for (auto device = 20 + random() % 100; device != 0; --device) {
+      const auto region = random() % regions;
+      for (std::int32_t day = 0; day < 2; ++day) {
+        const auto digest = random() % noise == 0 ? random() % 4 : region / 2 + device % 2;
+        LogRecord& record = any.add(day, "1", "R" + std::to_string(region));
+        record.whitelistDigest = record.texts.keep("d" + std::to_string(digest));
+      }
+    }
+    const LogTable logs(any.engine());
+    Ledger fresh(logs, 3 + random() % 8);
+    const std::vector<Division> divisions = divisionsOf(fresh);
+    for (const Division& division : divisions)
+      groups += division.groups.size();
+    expectNothingSmallFollowsFromTwo(divisions, fresh);
+  }
+  EXPECT_GT(groups, 1000u);
 }
 
 TEST(PrivacyTest, APageLeavesSmallVersionsOut) {

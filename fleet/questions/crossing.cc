@@ -1,0 +1,114 @@
+#include "fleet/questions/crossing.h"
+
+#include <algorithm>
+#include <numeric>
+#include <tuple>
+
+namespace tavrel::fleet {
+
+namespace {
+
+/// Disjoint sets of groups.
+class Components {
+ public:
+  explicit Components(std::size_t groups) : parent_(groups) {
+    std::iota(parent_.begin(), parent_.end(), 0U);
+  }
+
+  std::uint32_t of(std::size_t group) {
+    while (parent_[group] != group) {
+      parent_[group] = parent_[parent_[group]];
+      group = parent_[group];
+    }
+    return static_cast<std::uint32_t>(group);
+  }
+  void unite(std::size_t a, std::size_t b) { parent_[of(a)] = of(b); }
+
+ private:
+  std::vector<std::uint32_t> parent_;
+};
+
+}  // namespace
+
+Crossing::Crossing(const LogTable& table, const std::vector<const LogSet*>& groups,
+                   const Sets& earlier, std::size_t devicesAtLeast)
+    : groups_(groups.size()), earlier_(earlier.size()), devicesAtLeast_(devicesAtLeast) {
+  std::vector<std::uint32_t> earlierOf(table.size());
+  for (std::uint32_t i = 0; i < earlier_; ++i)
+    earlier[i]->forEach([&](LogIndex log) { earlierOf[log] = i; });
+  std::vector<std::size_t> cellOf(earlier_);  // position in cells_, plus 1
+  for (std::uint32_t group = 0; group < groups_; ++group) {
+    const std::size_t begin = cells_.size();
+    groups[group]->forEach([&](LogIndex log) {
+      const std::uint32_t other = earlierOf[log];
+      const std::uint32_t day = table.dayIndex(log);
+      std::size_t& cell = cellOf[other];
+      if (cell <= begin || cells_[cell - 1].day != day) {
+        cells_.push_back({group, static_cast<std::uint32_t>(groups_ + other), day, 0});
+        cell = cells_.size();
+      }
+      ++cells_[cell - 1].logs;
+    });
+  }
+}
+
+// A group covers another only when it shares logs with it. So whoever subtracts a group has taken
+// all groups that share logs with it, and whoever takes one has subtracted all those with which it
+// shares many logs: otherwise many remain. Groups that are taken or subtracted only together form a
+// component. When intersections remain between components, some of them can be left over alone.
+std::optional<std::size_t> Crossing::groupToJoin(const std::vector<bool>& isJoined,
+                                                 std::span<const std::size_t> order) const {
+  Components components(groups_ + earlier_);
+  std::optional<std::size_t> joined;
+  for (std::size_t group = 0; group < groups_; ++group) {
+    if (!isJoined[group]) continue;
+    if (joined) components.unite(group, *joined);
+    joined = group;
+  }
+  for (const Cell& cell : cells_)
+    if (cell.logs >= devicesAtLeast_) components.unite(cell.group, cell.earlier);
+
+  std::vector<Cell> between;  // of components, in place of groups
+  for (bool hasChanged = true; hasChanged;) {
+    hasChanged = false;
+    between.clear();
+    for (const Cell& cell : cells_) {
+      const std::uint32_t group = components.of(cell.group);
+      const std::uint32_t earlier = components.of(cell.earlier);
+      if (group != earlier) between.push_back({group, earlier, cell.day, cell.logs});
+    }
+    const auto pairOf = [](const Cell& cell) { return std::tuple(cell.group, cell.earlier); };
+    std::sort(between.begin(), between.end(), [](const Cell& a, const Cell& b) {
+      return std::tie(a.group, a.earlier, a.day) < std::tie(b.group, b.earlier, b.day);
+    });
+    std::size_t logs = 0;
+    for (std::size_t i = 0; i < between.size(); ++i) {
+      const Cell& cell = between[i];
+      const bool goesOn = i != 0 && pairOf(between[i - 1]) == pairOf(cell);
+      logs = goesOn && between[i - 1].day == cell.day ? logs + cell.logs : cell.logs;
+      // With intersections in both directions, either both or none remain, of opposite sign.
+      if (logs >= devicesAtLeast_ ||
+          (!goesOn &&
+           std::ranges::binary_search(between, std::tuple(cell.earlier, cell.group), {}, pairOf))) {
+        components.unite(cell.group, cell.earlier);
+        hasChanged = true;
+      }
+    }
+  }
+  if (between.empty()) return std::nullopt;
+
+  std::vector<bool> isInvolved(groups_ + earlier_);
+  for (const Cell& cell : between)
+    isInvolved[cell.group] = isInvolved[cell.earlier] = true;
+  // Joining groups of one component changes nothing.
+  if (joined && isInvolved[components.of(*joined)]) isInvolved[components.of(*joined)] = false;
+  std::optional<std::size_t> any;
+  for (const std::size_t group : order) {
+    if (isJoined[group]) continue;
+    if (isInvolved[components.of(group)]) return group;
+    if (!any) any = group;
+  }
+  return any;
+}
+
+}  // namespace tavrel::fleet
