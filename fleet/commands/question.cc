@@ -5,6 +5,7 @@
 #include <nlohmann/json.hpp>
 
 #include "base/civil_time.h"
+#include "base/parse_number.h"
 #include "fleet/questions/day_range.h"
 #include "fleet/questions/grouping.h"
 #include "tools/shared/table.h"
@@ -63,12 +64,15 @@ Question::Question(FleetContext& context, const QuestionOptions& options)
 
 DayRange Question::readDays(std::string_view text) const {
   // One device with a wrong clock must not decide which days are the newest.
-  std::int32_t newest = table_.days().back().day;
+  std::optional<std::int32_t> newest;
   for (const LogTable::Day& day : table_.days()) {
     if (day.end - day.begin >= ledger_.devicesAtLeast()) newest = day.day;
   }
-  const auto days = parseDayRange(text, newest);
+  const auto days = parseDayRange(text, newest.value_or(0));
   if (!days) throw UsageError(days.error().message);
+  // Without such a day nothing can be shown, not even the day of a log.
+  if (!newest && parseNumber<std::uint32_t>(text))
+    throw std::runtime_error(tooFewText(ledger_.devicesAtLeast()));
   return *days;
 }
 

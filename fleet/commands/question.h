@@ -44,7 +44,8 @@ class Question {
   Ledger& ledger() { return ledger_; }
   const DayRange& days() const { return days_; }
 
-  /// A number of days ends with the newest day that has enough devices.
+  /// A number of days ends with the newest day that has enough devices. Throws UsageError, and
+  /// std::runtime_error with a readable line when there is no such day.
   DayRange readDays(std::string_view text) const;
   /// Those of enough devices, by number.
   const std::vector<std::string>& versions() const { return versions_; }

@@ -314,6 +314,15 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   }
   EXPECT_EQ(run(file, {"summary", "--devices-at-least", "41"}).out,
             "All logs: fewer than 41 devices: nothing is shown\n");
+  for (std::vector<std::string> arguments :
+       {std::vector<std::string>{"summary", "--json", "--days", "7"},
+        {"show", "=sum", "--against", "7"}}) {
+    arguments.insert(arguments.end(), {"--devices-at-least", "41"});
+    const Output output = run(file, arguments);
+    EXPECT_EQ(output.error, "tavrel-fleet: fewer than 41 devices: nothing is shown\n");
+    EXPECT_EQ(output.out, "");
+    EXPECT_EQ(output.status, 1);
+  }
   for (const auto& [where, message] :
        {std::pair("http://h/d",
                   "no database has an address that begins with \"http://\": write "
