@@ -134,10 +134,18 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
       next = group.firstDay + 1;
     }
     if (chart.values.size() < 2) continue;
+    for (; next <= summary.whole.lastDay; ++next)
+      chart.values.push_back(std::nullopt);
     chart.first = dateText(civilFromDays(summary.whole.firstDay));
-    chart.last = dateText(civilFromDays(next - 1));
+    chart.last = dateText(civilFromDays(summary.whole.lastDay));
     html.element("h3", "Devices that reported, by day");
     writeLineChart(html, chart);
+    if (part.joined == 0) continue;
+    html.element("p",
+                 "Without " + counted(part.joined, "day") +
+                     ", so that nothing reveals groups of fewer than " +
+                     countText(summary.devicesAtLeast) + " devices.",
+                 {{"class", "note"}});
   }
 }
 

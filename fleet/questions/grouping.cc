@@ -76,11 +76,10 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
       ++smallValues;
     }
   }
-  if (order.size() > kMostGroups) {
+  if (order.size() > kMostGroups && !byDay) {
     std::nth_element(order.begin(), order.begin() + kMostGroups, order.end(), [&](auto a, auto b) {
-      if (counts[a] != counts[b]) return counts[a] > counts[b];
       // Texts are numbered in the order of loading.
-      return byDay ? a < b : texts[a] < texts[b];
+      return counts[a] != counts[b] ? counts[a] > counts[b] : texts[a] < texts[b];
     });
     smallValues += order.size() - kMostGroups;
     order.resize(kMostGroups);

@@ -16,8 +16,8 @@ namespace tavrel::fleet {
 bool versionLess(std::string_view a, std::string_view b);
 
 /// One group for each value of the attribute that occurs among `logs`, in order (versions by
-/// number, days by date); `kNone` yields one group. Values with fewer than `logsAtLeast` logs, and
-/// those beyond the thousand most frequent, form one group of the kind kOther.
+/// number, days by date); `kNone` yields one group. Values with fewer than `logsAtLeast` logs form
+/// one group of the kind kOther, and so do those beyond the thousand most frequent, except days.
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast);
 

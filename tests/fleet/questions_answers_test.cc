@@ -66,8 +66,9 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
 TEST(ShowTest, JoinsTheSameValuesInWhateverOrderTheyWereLoaded) {
   TestFleet fleet;
   for (int region = 2000; region >= 1000; --region)
-    fleet.add(1, "OS", std::to_string(region));
+    fleet.add(region, "OS", std::to_string(region));
   const LogTable table(fleet.engine());
+  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::kDay, 1).at(1000).name.value, "1975-06-24");
   EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::kRegion, 1).at(999).name.value, "1999");
 }
 
@@ -278,6 +279,19 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
   const SummaryAnswer summary = summarise(fleet.engine(), *std::make_unique<Ledger>(later, 10), {});
   EXPECT_EQ(summary.whole.lastDay, 1) << "the second day has one device";
   EXPECT_EQ(summary.scalarKeys, 1u);
+}
+
+TEST(PrivacyTest, APageSaysWhichDaysItJoins) {
+  TestFleet fleet;
+  for (const auto& [day, devices] : {std::pair(1, 12), {2, 12}, {3, 11}, {4, 5}})
+    for (int device = 0; device < devices; ++device)
+      fleet.add(day, "1");
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 10);
+  const std::string page = textOf(askForPage(fleet.engine(), ledger, {}));
+  EXPECT_EQ(page.find("1970-01-03"), std::string::npos) << "the chart ends before the last day";
+  EXPECT_THAT(page, testing::HasSubstr("Without 2 days, so that nothing reveals groups of fewer "
+                                       "than 10 devices."));
 }
 
 TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
