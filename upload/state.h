@@ -18,12 +18,14 @@ struct State {
   std::optional<plist::Date> lastAttempt;  // of a run that sent a log, or tried to
   std::optional<plist::Date> lastSuccess;
   std::optional<plist::Date> lastFailure;
-  std::optional<plist::Date> nextAttempt;  // the earliest; absent after a success
-  std::string failure;                     // the latest, one line; empty after a success
+  std::optional<plist::Date> nextAttempt;  // the earliest; absent after a failure is over
+  std::string failure;                     // the latest, one line; empty once it is over
   std::int64_t failedAttempts = 0;         // in a row, for whatever reason
   std::int64_t failedTransfers = 0;        // in a row; determines the pause
   std::int64_t sent = 0;                   // in total
   std::int64_t refused = 0;                // in total
+
+  bool hasFailure() const { return !failure.empty() || failedAttempts > 0 || nextAttempt; }
 };
 
 inline constexpr const char* kStatePath = "/var/lib/tavrel/upload/state.plist";

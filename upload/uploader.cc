@@ -108,6 +108,9 @@ Outcome Uploader::run(bool atOnce) {
   }
   if (!*lock) return Outcome::Done;
   Outcome outcome = runLocked(atOnce);
+  // Nothing waits to be sent, so an earlier failure is over.
+  const bool isOver = outcome == Outcome::Done && complaint_.empty() && state_.hasFailure();
+  if (isOver) succeed();
   if (!complaint_.empty()) {
     state_.failure = complaint_;
     state_.lastFailure = services_.clock.now();
@@ -115,7 +118,7 @@ Outcome Uploader::run(bool atOnce) {
     if (outcome == Outcome::Done) outcome = Outcome::Failed;
   }
   if (failed_ || !complaint_.empty()) ++state_.failedAttempts;
-  if (tried_ || !complaint_.empty()) {
+  if (tried_ || isOver || !complaint_.empty()) {
     if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
         !written) {
       services_.log.write(LogLevel::Error, written.error().message);
@@ -358,12 +361,12 @@ void Uploader::fail(std::string line, std::int64_t serverWish) {
   failed_ = true;
   ++state_.failedTransfers;
   state_.lastFailure = now;
-  const double next =
-      now.secondsSinceEpoch() + pauseSeconds(state_.failedTransfers, serverWish, chance());
-  state_.nextAttempt = plist::Date::sinceEpoch(next);
+  // The state stores whole seconds.
+  state_.nextAttempt = plist::Date::sinceEpoch(std::floor(
+      now.secondsSinceEpoch() + pauseSeconds(state_.failedTransfers, serverWish, chance())));
   state_.failure = std::move(line);
   services_.log.log(LogLevel::Error, "%s; next attempt after %s", state_.failure,
-                    isoDateText(plist::Date::sinceEpoch(std::ceil(next))));
+                    isoDateText(*state_.nextAttempt));
 }
 
 Outcome Uploader::removeWaiting() {

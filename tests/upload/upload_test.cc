@@ -128,6 +128,9 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
     device.clock.time = plist::Date::since1970(0);
     EXPECT_EQ(device.run(), Outcome::Waits);
     EXPECT_GT(server.connections, connections) << "another clock";
+    device.permit("<false/>");
+    EXPECT_EQ(device.run(), Outcome::Done);
+    EXPECT_FALSE(device.state().hasFailure()) << "nothing waits";
   }
   Device device;
   std::string noise(8 << 20, '\0');
