@@ -66,7 +66,7 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
                       std::to_string(today() - 1) + " (" + isoAgo(kDay).substr(0, 10) +
                       "): diagnostic submission not allowed\n"
                       "OK store: none yet\n"
-                      "OK limits: nothing removed since yesterday\n"
+                      "OK limits: nothing removed early since yesterday\n"
                       "OK lost-values: none since yesterday\n"
                       "OK folding: no program records in memory\n"
                       "OK queue pending: empty\n"
@@ -169,16 +169,17 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
             std::string::npos);
   device.write("/etc/tavrel/limits.plist", "garbage");
-  expect(
-      "WARNING limits: nothing removed since yesterday; " + device.path("/etc/tavrel/limits.plist"),
-      1);
+  expect("WARNING limits: nothing removed early since yesterday; " +
+             device.path("/etc/tavrel/limits.plist"),
+         1);
   std::filesystem::remove(device.path("/etc/tavrel/limits.plist"));
   const char* const failures = "/var/lib/tavrel/tidy-failures";
   device.write(failures, "no room\nnor time\n");
   std::filesystem::last_write_time(
       device.path(failures), std::filesystem::file_time_type::clock::now() - std::chrono::hours(3));
   expect(
-      "WARNING limits: nothing removed since yesterday; 'tavrelctl tidy' failed 3 h ago: no room\n",
+      "WARNING limits: nothing removed early since yesterday; 'tavrelctl tidy' failed 3 h ago: no "
+      "room\n",
       1);
   std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);

@@ -104,7 +104,11 @@ TEST(WhitelistCheck, LooksAtTheDistributionsOfTheLastWholeDay) {
               [1, 2, 3, 4, 5, 6, 7, 8, 9]}, "coarse": {"intervals": [1, 2]}}},
     "InternalTesting": {"DistributionKeyPrefixes": {"u": {}}, "ScalarKeys": {"s": {}}}})"));
   EXPECT_EQ(device.run("whitelist check").status, 0);
-  std::string lines = "value\ttoday\tcoarse\t1\t1\n";
+  device.run("stat import", "value\ttoday\tfew\t1\t1\n");
+  EXPECT_EQ(device.run("whitelist check").status, 0) << "today is not over";
+  device.run("stat import", "value\t19999\tfew\t1\t1\n");
+  EXPECT_NE(device.run("whitelist check").out.find(" reveal its only value\n"), std::string::npos);
+  std::string lines;
   for (int i = 1; i <= 15; ++i) {
     const std::string number = std::to_string(i);
     for (const std::string key : {"few", "spoilt", "fine", "coarse", "unlisted"}) {

@@ -118,7 +118,7 @@ void checkCounters(CheckScene& scene, const Recorders& recorders,
     const auto listing = (*folder)->list();
     if (listing && hasClosedSegments(*listing)) gap = kClosedSegments;
   }
-  Check limits = reached.check("limits", "nothing removed", kReached, gap);
+  Check limits = reached.check("limits", "nothing removed early", kReached, gap);
   judgeTidying(scene, limits);
   scene.checks.push_back(std::move(limits));
   scene.checks.push_back(lost.check("lost-values", "none", kLost, gap));

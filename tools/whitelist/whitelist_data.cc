@@ -65,9 +65,8 @@ class DataCheck {
                         which, shown.notNumbers, counts));
     }
     if (shown.values > 0 && shown.values <= kKnownFromSummary) {
-      add(*rule,
-          format("%s: minimum, maximum, mean and deviation are exact and reveal each of its %s",
-                 which, counts));
+      add(*rule, format("%s: minimum, maximum, mean and deviation are exact and reveal %s", which,
+                        shown.values == 1 ? "its only value" : "each of its " + counts));
     } else if (shown.buckets >= kFewBuckets && 2 * shown.buckets > shown.values) {
       add(*rule, format("%s: intervals are finer than what is recorded: %s fill %lld buckets",
                         which, counts, shown.buckets));
@@ -85,11 +84,10 @@ class DataCheck {
   WhitelistRules rules_;
 };
 
-// The last day before today; when there is none, the first day on record.
+// The last day before today.
 std::optional<std::int32_t> dayToCheck(const std::vector<std::int32_t>& days, std::int32_t today) {
-  if (days.empty()) return std::nullopt;
   const auto next = std::ranges::lower_bound(days, today);
-  return next == days.begin() ? *next : *std::prev(next);
+  return next == days.begin() ? std::nullopt : std::optional(*std::prev(next));
 }
 
 }  // namespace

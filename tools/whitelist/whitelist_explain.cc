@@ -71,7 +71,7 @@ std::string ruleText(const KindExplanation& kind) {
     case Rule::Exact:
       return format("group %s, exact key", kind.group);
     case Rule::Prefix:
-      return format("group %s, prefix %s", kind.group, kind.prefix);
+      return format("group %s, prefix %s", kind.group, kind.prefix.empty() ? "\"\"" : kind.prefix);
     case Rule::Internal:
       return "no rule, but this is an internal device";
     case Rule::None:
