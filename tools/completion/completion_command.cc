@@ -71,7 +71,8 @@ void listDomains(ToolContext& context) {
 
 void listLogs(ToolContext& context) {
   context.out() << "latest\n";
-  for (const auto place : {FileSubmission::Place::Pending, FileSubmission::Place::Outbox}) {
+  using enum FileSubmission::Place;
+  for (const auto place : {Pending, Outbox, Refused}) {
     const auto logs = context.linuxPlatform().submission().files(place);
     if (!logs) return context.fail(logs.error().message);
     for (const FileSubmission::FiledLog& log : *logs)

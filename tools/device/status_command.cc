@@ -32,6 +32,7 @@ struct DeviceStatus {
   Expected<std::size_t> pending = 0;
   Expected<std::size_t> outbox = 0;
   Expected<std::size_t> withheld = 0;
+  Expected<std::size_t> refused = 0;
   LogConclusion conclusion;
 };
 
@@ -68,6 +69,7 @@ DeviceStatus takeStatus(ToolContext& context) {
   status.pending = device.submission().count(FileSubmission::Place::Pending);
   status.outbox = device.submission().count(FileSubmission::Place::Outbox);
   status.withheld = device.submission().count(FileSubmission::Place::Withheld);
+  status.refused = device.submission().count(FileSubmission::Place::Refused);
   if (status.isStateReadable) status.conclusion = concludeOnLogs(context);
   return status;
 }
@@ -98,6 +100,7 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
        {"pending_logs", status.pending ? Json(*status.pending) : Json(nullptr)},
        {"outbox_logs", status.outbox ? Json(*status.outbox) : Json(nullptr)},
        {"withheld_logs", status.withheld ? Json(*status.withheld) : Json(nullptr)},
+       {"refused_logs", status.refused ? Json(*status.refused) : Json(nullptr)},
        {"conclusion", status.isStateReadable ? status.conclusion.json() : Json(nullptr)}});
 }
 
@@ -133,6 +136,12 @@ void printText(ToolContext& context, const DeviceStatus& status) {
   } else if (*status.withheld > 0) {
     table.add({"Withheld logs", format("%zu, never sent", *status.withheld)});
   }
+  if (!status.refused) {
+    table.add({"Refused logs", "unreadable"});
+  } else if (*status.refused > 0) {
+    table.add(
+        {"Refused logs", {format("%zu, refused by the server", *status.refused), Emphasis::Alarm}});
+  }
   table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
              status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
   table.print({context.out(), std::nullopt, context.page().isColoured});
@@ -157,8 +166,9 @@ void addStatusCommand(Command app, ToolContext& context) {
     }
     if (context.hasComplaints()) context.setExitStatus(kExitFailure);
     if (!status.days) context.fail(status.days.error().message);
-    if (!status.pending || !status.outbox)
-      context.fail((status.pending ? status.outbox : status.pending).error().message);
+    for (const auto* count : {&status.pending, &status.outbox, &status.refused}) {
+      if (!*count) return context.fail(count->error().message);
+    }
   });
 }
 

@@ -45,7 +45,7 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
   using enum FileSubmission::Place;
   std::vector<FiledLog> logs;
   std::optional<Error> closed;
-  for (const auto place : {Withheld, Outbox, Pending}) {
+  for (const auto place : {Withheld, Refused, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
     // Only root may see withheld logs; other users get the rest.
     if (!found && place == Withheld) {
@@ -82,7 +82,7 @@ void readFacts(ToolContext& context, std::vector<FiledLog>& logs) {
 }  // namespace
 
 std::string_view nameOf(FileSubmission::Place place) {
-  constexpr std::string_view kNames[] = {"pending", "outbox", "withheld"};
+  constexpr std::string_view kNames[] = {"pending", "outbox", "withheld", "refused"};
   return kNames[static_cast<std::size_t>(place)];
 }
 

@@ -18,7 +18,7 @@ struct FiledLog : FileSubmission::FiledLog {
   std::optional<struct stat> status;  // nothing when unknown
 };
 
-/// "pending", "outbox" or "withheld".
+/// "pending", "outbox", "withheld" or "refused".
 std::string_view nameOf(FileSubmission::Place place);
 
 /// The name of its file, with the extension.

@@ -16,7 +16,6 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission";
-constexpr std::string_view kRefused = "/refused";
 
 constexpr std::size_t kWithheldLogs = 8;
 
@@ -343,7 +342,7 @@ RemovedLogs FileSubmission::removeWaiting() {
 
 RemovedLogs FileSubmission::removeAll() {
   return removeLogs({folder(Place::Pending), folder(Place::Outbox), folder(Place::Withheld),
-                     folder_ + std::string(kRefused)},
+                     folder(Place::Refused)},
                     false);
 }
 
@@ -361,7 +360,7 @@ RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
 }
 
 std::string FileSubmission::folder(Place place) const {
-  constexpr const char* kNames[] = {"/pending", "/outbox", "/withheld"};
+  constexpr const char* kNames[] = {"/pending", "/outbox", "/withheld", "/refused"};
   return folder_ + kNames[static_cast<std::size_t>(place)];
 }
 

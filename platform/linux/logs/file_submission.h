@@ -45,7 +45,7 @@ inline constexpr std::string_view kLogMetadataOptions = "Options";    // diction
 
 class FileSubmission final : public SubmissionService {
  public:
-  enum class Place { Pending, Outbox, Withheld };
+  enum class Place { Pending, Outbox, Withheld, Refused };
 
   /// A log that has been filed.
   struct FiledLog {
