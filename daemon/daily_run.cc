@@ -23,9 +23,11 @@ struct DailyWork {
 
 void report(DailyWork& work) {
   Platform& platform = work.platform;
-  work.logOutcome = platform.submission->isDiagnosticSubmissionEnabled()
+  SubmissionService& submission = platform.submission;
+  work.logOutcome = submission.isDiagnosticSubmissionEnabled()
                         ? BHReport(platform).writeLogForYesterday(work.day, work.appInfo)
-                        : LogOutcome::NotPermitted;
+                    : submission.isPermissionReadable() ? LogOutcome::NotPermitted
+                                                        : LogOutcome::PermissionUnknown;
   // The error of a log that could not be filed is already logged.
   if (work.logOutcome == LogOutcome::Filed || work.logOutcome == LogOutcome::NotFiled) return;
   platform.log->write(LogLevel::Info, logOutcomeText(work.logOutcome, std::to_string(work.day)));

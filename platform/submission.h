@@ -30,6 +30,9 @@ class SubmissionService {
   /// Whether the user allows diagnostic submission.
   virtual bool isDiagnosticSubmissionEnabled() = 0;
 
+  /// False when it cannot be known whether the user allows submission; it then counts as forbidden.
+  virtual bool isPermissionReadable() = 0;
+
   /// Whether internal diagnostics are enabled for the identifier.
   virtual bool hasInternalDiagnostics(std::string_view identifier) = 0;
 

@@ -18,6 +18,7 @@ struct OutcomeTexts {
 constexpr OutcomeTexts kTexts[] = {
     {"filed", ""},
     {"not-permitted", "diagnostic submission not allowed"},
+    {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},
     {"not-filed", "filing failed; see the system log"},

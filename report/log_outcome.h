@@ -13,6 +13,7 @@ namespace tavrel {
 enum class LogOutcome : std::uint8_t {
   Filed,
   NotPermitted,
+  PermissionUnknown,  // preferences cannot be read; the system log has the error
   NoWhitelist,
   NothingToReport,
   NotFiled,  // the system log has the error

@@ -147,6 +147,11 @@ TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {
   const Array apps{Dictionary{{"bundle", "a"}}};
   dailyTasksForDay(fake.platform, 19999, apps);
   EXPECT_EQ(fake.journal, kTasks);
+  fake.submission.permissionReadable = false;
+  EXPECT_EQ(dailyTasksForDay(fake.platform, 19999, apps), LogOutcome::PermissionUnknown);
+  EXPECT_EQ(std::ranges::count(fake.log.messages(),
+                               "no log for day 19999: the permission cannot be read"),
+            1);
 
   fake.submission.enabled = true;
   fake.journal.clear();

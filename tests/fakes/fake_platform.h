@@ -120,6 +120,7 @@ struct FakeSubmission : SubmissionService {
   };
   Journal& journal;
   bool enabled = true;
+  bool permissionReadable = true;
   bool fails = false;
   std::string osVersion = "Pellio 7.1 (21A5)";
   std::set<std::string, std::less<>> internalDiagnostics;
@@ -127,6 +128,7 @@ struct FakeSubmission : SubmissionService {
   std::vector<Log> logs;
 
   bool isDiagnosticSubmissionEnabled() override { return enabled; }
+  bool isPermissionReadable() override { return permissionReadable; }
   bool hasInternalDiagnostics(std::string_view identifier) override {
     return internalDiagnostics.contains(identifier);
   }

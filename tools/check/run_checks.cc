@@ -67,6 +67,8 @@ CheckState stateOf(LogOutcome outcome) {
     case LogOutcome::Filed:
     case LogOutcome::NotPermitted:  // the owner's decision, which the permission check shows
       return CheckState::Ok;
+    case LogOutcome::PermissionUnknown:
+      return CheckState::Unknown;
     case LogOutcome::NoWhitelist:
     case LogOutcome::NothingToReport:
       return CheckState::Warning;

@@ -123,9 +123,10 @@ Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::st
 }
 
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
-                                            const std::function<bool(const FiledLog&)>& accepts) {
+                                            const std::function<bool(const FiledLog&)>& accepts,
+                                            std::optional<Error>& unseen) {
   FileSubmission& submission = context.linuxPlatform().submission();
-  auto files = filesOfLogs(context);
+  auto files = filesOfLogs(context, &unseen);
   if (!files) return files.error();
   std::vector<std::pair<double, FiledLog>> candidates;
   for (FiledLog& log : *files) {

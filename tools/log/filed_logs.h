@@ -38,9 +38,11 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
 Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name);
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes; nothing when there
-/// is none. The choice goes by file names, so few metadata files are read.
+/// is none. The choice goes by file names, so few metadata files are read. `unseen` receives the
+/// reason why withheld logs cannot be seen.
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
-                                            const std::function<bool(const FiledLog&)>& accepts);
+                                            const std::function<bool(const FiledLog&)>& accepts,
+                                            std::optional<Error>& unseen);
 
 /// The filed log that `name` identifies: its path, or its file name with or without the extension.
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);

@@ -45,7 +45,9 @@ struct Arguments {
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   std::optional<FiledLog> found;
   if (name == "latest") {
-    auto latest = newestLog(context, kTalliedLogName, [](const FiledLog&) { return true; });
+    std::optional<Error> unseen;  // no daily log is withheld
+    auto latest = newestLog(
+        context, kTalliedLogName, [](const FiledLog&) { return true; }, unseen);
     if (!latest) return latest.error();
     if (!*latest) {
       const LogConclusion conclusion = concludeOnLogs(context);

@@ -67,7 +67,9 @@ LogConclusion concludeOnLogs(ToolContext& context) {
   conclusion.permission = submissionPermission(preferences);
   conclusion.whitelist = whitelistState(context);
   if (!conclusion.permission.covers(next)) {
-    conclusion.outcome = LogOutcome::NotPermitted;
+    conclusion.outcome = platform.submission->isPermissionReadable()
+                             ? LogOutcome::NotPermitted
+                             : LogOutcome::PermissionUnknown;
   } else if (!conclusion.whitelist.isUsable) {
     conclusion.outcome = LogOutcome::NoWhitelist;
   }

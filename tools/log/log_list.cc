@@ -89,7 +89,7 @@ void listLogs(ToolContext& context, std::size_t most) {
   if (context.json()) {
     context.printJson({{"logs", std::move(entries)}, {"older_logs", filed->older}});
   } else if (table.empty()) {
-    context.out() << "no logs\n";
+    if (!filed->unseen) context.out() << "no logs\n";
   } else {
     table.print(context.page());
   }

@@ -206,13 +206,17 @@ bool isNandLog(const FiledLog& log) {
 }
 
 void show(ToolContext& context) {
-  const auto found = newestLog(context, kNandLogName, isNandLog);
+  std::optional<Error> unseen;
+  const auto found = newestLog(context, kNandLogName, isNandLog, unseen);
   if (!found) return context.fail(found.error().message);
+  if (unseen) context.fail(unseen->message);
   const std::optional<FiledLog>& newest = *found;
   const NextLog next = nextLog(context);
   Json document = {{"log", nullptr}, {"next", jsonOf(next)}};
   std::string fault;
-  if (!newest) {
+  if (!newest && unseen) {
+    // It may be among those.
+  } else if (!newest) {
     fault = "no NAND log found: a run writes one when write amplification is high";
   } else {
     const LogEnvelope envelope{std::string(nameOf(newest->place)), newest->path, newest->metadata};

@@ -61,6 +61,7 @@ class OverlaySubmission final : public SubmissionService {
       : below_(below), events_(events) {}
 
   bool isDiagnosticSubmissionEnabled() override;
+  bool isPermissionReadable() override { return below_.isPermissionReadable(); }
   bool hasInternalDiagnostics(std::string_view identifier) override;
   bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
                                 const plist::Dictionary& options, const LogWriter& writer) override;

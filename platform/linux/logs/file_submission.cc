@@ -75,6 +75,10 @@ bool FileSubmission::isDiagnosticSubmissionEnabled() {
   return false;
 }
 
+bool FileSubmission::isPermissionReadable() {
+  return static_cast<bool>(storedSubmissionPermission(services_.filePreferences));
+}
+
 // The switch may have been turned off by hand, or a deletion cut short. Unreadable preferences may
 // hold a permission: then nothing is sent, and nothing deleted.
 void FileSubmission::completeWithdrawal() {

@@ -74,6 +74,7 @@ class FileSubmission final : public SubmissionService {
   /// all waiting logs, as `removeWaiting` does, and a first day left over from an earlier
   /// permission.
   bool isDiagnosticSubmissionEnabled() override;
+  bool isPermissionReadable() override;
   bool hasInternalDiagnostics(std::string_view identifier) override;
   bool ZTXWriteLogForSubmission(std::string_view logType, std::string_view logName,
                                 const plist::Dictionary& options, const LogWriter& writer) override;
