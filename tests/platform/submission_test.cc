@@ -279,7 +279,7 @@ TEST(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
   permit(device, false, kToday + 1);
   EXPECT_EQ(ask(),
             (std::vector<std::string>{"submission is not allowed: 3 waiting logs deleted",
-                                      "no log is sent on: submission is no longer allowed"}));
+                                      "no log is moved to the outbox: submission is not allowed"}));
   EXPECT_EQ(files(), (std::set<std::string>{"foreign", "foreign.txt"}));
   EXPECT_EQ(contentOf(device.root.path(kPermission)).find("FirstDay"), std::string::npos);
 }

@@ -201,7 +201,7 @@ Status FileSubmission::commit(NewFile& file, const Destination& destination,
 Status FileSubmission::checkPermission() const {
   const auto stored = storedSubmissionPermission(services_.filePreferences);
   if (!stored) return stored.error();
-  if (!stored->isGiven) return Error{"submission is no longer allowed"};
+  if (!stored->isGiven) return Error{"submission is not allowed"};
   return Done{};
 }
 
@@ -244,7 +244,7 @@ void FileSubmission::removeOldMetadata(Place place, const std::string& freshMeta
 
 void FileSubmission::submitDiagnosticLogs() {
   if (Status permitted = checkPermission(); !permitted) {
-    log_.log(LogLevel::Info, "no log is sent on: %s", permitted.error().message);
+    log_.log(LogLevel::Info, "no log is moved to the outbox: %s", permitted.error().message);
     return;
   }
   const auto files = files_.list(folder(Place::Pending));
