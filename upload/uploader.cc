@@ -86,8 +86,7 @@ Uploader::Permission Uploader::permission() {
                                                    &isThere);
   permitted_ = submissionPermission(services_.preferences);
   if (!permitted_.isGiven) return isThere ? Permission::Withdrawn : Permission::NotGiven;
-  const bool isUsable = permitted_.firstDay != SubmissionPermission::kNoDay;
-  return isUsable ? Permission::Given : Permission::NotGiven;
+  return permitted_.isHeldBack() ? Permission::NotGiven : Permission::Given;
 }
 
 std::chrono::milliseconds Uploader::timeLeft() const {
@@ -132,10 +131,8 @@ Outcome Uploader::runLocked(bool atOnce) {
   state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
-  if (permitted_.isGiven && permitted == Permission::NotGiven) {
-    complain(
-        format("no log is sent: %s of %s is not a day: set it to an integer, days since 1970-01-01",
-               kSubmissionFirstDayKey, kDiagnosticsDomain));
+  if (permitted_.isHeldBack()) {
+    complain(format("no log is sent: submission is %s", textOf(permitted_)));
   }
   if (permitted == Permission::NotGiven) return Outcome::Done;
   if (Status taken = outbox_.takePending([this] { return permission() == Permission::Given; });

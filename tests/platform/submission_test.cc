@@ -187,8 +187,8 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
       {true, kToday, kToday - 1, "pending", false, "165"},
       {false, {}, kToday - 1, "withheld", false, "165"},
       {true, kToday + 1, kNoRows, "withheld", false},
-      {true, "soon", kToday - 1, "submission is allowed from day 2147483647", false},
-      {true, 1.5, kToday - 1, "submission is allowed from day 2147483647", false},
+      {true, "soon", kToday - 1, "submission is held back", false},
+      {true, 1.5, kToday - 1, "submission is held back", false},
   };
   for (const auto& given : kCases) {
     SCOPED_TRACE(testing::Message() << given.isGiven << given.day << given.place);

@@ -143,7 +143,14 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
     expect("WARNING last-log: the next run: no log for day", 1);
   }
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionFirstDay 1.5 --float --force");
-  expect("WARNING permission: DiagnosticSubmissionFirstDay is a real: set it as an integer\n", 1);
+  expect(
+      "WARNING permission: held back: DiagnosticSubmissionFirstDay is not a day: run 'tavrelctl "
+      "allow'\n",
+      1);
+  EXPECT_EQ(device.json("status --check", {}, 1)["checks"][0]["figures"]["allowed"], 0);
+  const auto status = device.json("status");
+  EXPECT_EQ(status["submission_allowed"], false);
+  EXPECT_EQ(status["submission_first_day"], nullptr);
   device.run({"prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionFirstDay", "--int",
               std::to_string(today() + 1)});
   expect("OK permission: the daily log may leave the device, from day", 1);

@@ -246,9 +246,8 @@ TEST(Upload, JudgesEachLogByItsDay) {
   const std::string kNand = "StorageStatus-20261127T180106Z-5f0c9a1e";
   const std::string wait = "logs of earlier days wait: ";
   const std::string none =
-      "no log is sent: DiagnosticSubmissionFirstDay of com.norvane.zentrix is not a day: set it to "
-      "an "
-      "integer, days since 1970-01-01";
+      "no log is sent: submission is held back: DiagnosticSubmissionFirstDay is not a day: run "
+      "'tavrelctl allow'";
   // The first day, the logs that are sent, and the last line.
   const std::tuple<const char*, std::set<std::string>, std::string> cases[] = {
       {"<integer>20783</integer>", {nameOf(1), kNand}, "logs sent: 2, refused by the server: 0"},

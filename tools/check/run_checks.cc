@@ -85,10 +85,9 @@ void checkPermission(CheckScene& scene) {
   FilePreferences& preferences = scene.context.preferences();
   const plist::Value value =
       preferences.ZTXPreferencesGetValue(kSubmissionEnabledKey, kDiagnosticsDomain);
-  const plist::Value firstDay =
-      preferences.ZTXPreferencesGetValue(kSubmissionFirstDayKey, kDiagnosticsDomain);
-  const bool isAllowed = value.boolean().value_or(false);
-  const auto day = firstDay.number();
+  const SubmissionPermission permission = submissionPermission(preferences);
+  const bool isAllowed = permission.isGiven && !permission.isHeldBack();
+  const auto day = permission.firstDay;
   if (scene.context.hasComplaints()) {
     check.state = CheckState::Unknown;
     check.text = "preferences cannot be read";
@@ -100,13 +99,12 @@ void checkPermission(CheckScene& scene) {
       check.state = CheckState::Warning;
       check.text = format("%s is %s, which counts as no: set it as a boolean",
                           kSubmissionEnabledKey, kindWithArticle(value));
-    } else if (isAllowed && !firstDay.isNull() && (!day || day->isFloating())) {
+    } else if (permission.isHeldBack()) {
       check.state = CheckState::Warning;
-      check.text = format("%s is %s: set it as an integer", kSubmissionFirstDayKey,
-                          kindWithArticle(firstDay));
-    } else if (isAllowed && day && day->int64() >= scene.today) {
-      check.text += format(", from day %s on", dayText(day->int32()));
-      if (day->int64() - 1 > scene.today) {
+      check.text = textOf(permission);
+    } else if (isAllowed && day && *day >= scene.today) {
+      check.text += format(", from day %s on", dayText(*day));
+      if (*day - 1 > scene.today) {
         check.state = CheckState::Warning;
         check.text += ": 'tavrelctl allow --from DAY' names an earlier day";
       }

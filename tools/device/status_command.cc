@@ -89,10 +89,15 @@ void printJson(ToolContext& context, const DeviceStatus& status) {
     store["first_day"] = jsonOfDay((*status.days)->first);
     store["last_day"] = jsonOfDay((*status.days)->last);
   }
+  const SubmissionPermission permission = status.permission.value_or(SubmissionPermission());
+  const bool isHeldBack = permission.isHeldBack();
+  const auto known = [&status](bool fact) {
+    return status.permission ? Json(fact) : Json(nullptr);
+  };
   context.printJson(
-      {{"submission_allowed", status.permission ? Json(status.permission->isGiven) : Json(nullptr)},
-       {"submission_first_day",
-        jsonOfDay(status.permission ? status.permission->firstDay : std::nullopt)},
+      {{"submission_allowed", known(permission.isGiven && !isHeldBack)},
+       {"submission_held_back", known(isHeldBack)},
+       {"submission_first_day", jsonOfDay(isHeldBack ? std::nullopt : permission.firstDay)},
        {"today", jsonOfDay(status.today)},
        {"last_reported_day", jsonOfDay(status.lastDay)},
        {"last_os_version", status.osVersion ? Json(*status.osVersion) : Json(nullptr)},
@@ -116,6 +121,7 @@ std::string storeText(const DeviceStatus& status) {
 
 Table::Cell submissionCell(const DeviceStatus& status) {
   if (!status.permission) return {"unknown", Emphasis::Alarm};
+  if (status.permission->isHeldBack()) return {textOf(*status.permission), Emphasis::Alarm};
   if (status.permission->isGiven) return {textOf(*status.permission)};
   return {"not allowed (allow it with: tavrelctl allow)", Emphasis::Alarm};
 }

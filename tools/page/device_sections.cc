@@ -58,6 +58,7 @@ std::string titleOf(const Check& check) {
 
 std::string permissionText(const SubmissionPermission& permission) {
   if (!permission.isGiven) return "Not allowed";
+  if (permission.isHeldBack()) return capitalized(textOf(permission));
   return permission.firstDay ? format("From %s on", dayDateText(*permission.firstDay)) : "Allowed";
 }
 

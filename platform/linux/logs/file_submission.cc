@@ -66,9 +66,10 @@ bool FileSubmission::isDiagnosticSubmissionEnabled() {
   const SubmissionPermission permission = submissionPermission(services_.preferences);
   if (permission.covers(std::int64_t{today()} - 1)) return true;
   if (permission.isGiven) {
-    log_.log(LogLevel::Info,
-             "submission is %s: that day's log is made when the day is over, none before",
-             textOf(permission));
+    log_.log(LogLevel::Info, "submission is %s%s", textOf(permission),
+             permission.isHeldBack()
+                 ? ""
+                 : ": that day's log is made when the day is over, none before");
   } else if (!changesNothing_) {
     completeWithdrawal();
   }

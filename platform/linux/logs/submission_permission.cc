@@ -44,6 +44,9 @@ void setSubmissionPermission(Preferences& preferences, const SubmissionPermissio
 std::string textOf(const SubmissionPermission& permission) {
   if (!permission.isGiven) return "not allowed";
   if (!permission.firstDay) return "allowed";
+  if (permission.isHeldBack()) {
+    return format("held back: %s is not a day: run 'tavrelctl allow'", kSubmissionFirstDayKey);
+  }
   return format("allowed from day %d (%s) on", *permission.firstDay,
                 dateText(civilFromDays(*permission.firstDay)));
 }

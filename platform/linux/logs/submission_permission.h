@@ -27,6 +27,9 @@ struct SubmissionPermission {
   bool isGiven = false;                  // the switch
   std::optional<std::int32_t> firstDay;  // nothing: any day
 
+  /// The switch is on, but the first day is not a day, so nothing may leave.
+  bool isHeldBack() const { return isGiven && firstDay == kNoDay; }
+
   /// Whether a log of `day` may leave the device. The day is that of its statistics or, for a log
   /// without statistics, the one on which it was made.
   bool covers(std::int64_t day) const { return isGiven && (!firstDay || day >= *firstDay); }
@@ -44,7 +47,8 @@ Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& prefe
 /// Sets both preferences; the caller synchronises the domain.
 void setSubmissionPermission(Preferences& preferences, const SubmissionPermission& permission);
 
-/// "allowed", "allowed from day 20783 (2026-11-26) on" or "not allowed".
+/// "allowed", "allowed from day 20783 (2026-11-26) on", "not allowed", or "held back: " with the
+/// reason and the remedy.
 std::string textOf(const SubmissionPermission& permission);
 
 }  // namespace tavrel
