@@ -84,6 +84,11 @@ const Entry* findStatistic(std::string_view key) {
   return find(kStatistics, key);
 }
 
+std::string_view unitOf(std::string_view key) {
+  const Entry* const entry = findStatistic(key);
+  return entry != nullptr ? entry->unit : std::string_view();
+}
+
 const Entry* findChannel(std::string_view driver, std::string_view group,
                          std::string_view channel) {
   driver = driver.substr(0, driver.find(" <id "));

@@ -42,6 +42,9 @@ struct Entry {
 /// The entry for a statistic's key; null when there is none.
 const Entry* findStatistic(std::string_view key);
 
+/// The unit of a statistic; empty when unknown.
+std::string_view unitOf(std::string_view key);
+
 /// The entry for a live channel. The driver may include an id, as in "block <id 0x1f>".
 const Entry* findChannel(std::string_view driver, std::string_view group, std::string_view channel);
 

@@ -46,11 +46,6 @@ const char* kindName(const Comparison& one) {
   return one.key.kind == KeyKind::kScalar ? "scalar" : "distribution";
 }
 
-std::string unitOf(const std::string& key) {
-  const catalogue::Entry* entry = catalogue::findStatistic(key);
-  return entry != nullptr ? std::string(entry->unit) : "";
-}
-
 std::string leftOutText(const CompareAnswer& answer) {
   std::string text;
   const auto add = [&](std::size_t count, const std::string& why) {
@@ -95,7 +90,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
          signedText(one.difference),
          percentOf(one.relative),
          signedText(one.difference - one.margin) + " to " + signedText(one.difference + one.margin),
-         unitOf(one.key.name),
+         std::string(catalogue::unitOf(one.key.name)),
          one.effect ? signedText(rounded(*one.effect, 100)) : "constant",
          pValueText(one.adjustedPValue),
          withoutMean(one) == 0 ? "" : std::to_string(withoutMean(one))});
@@ -126,7 +121,7 @@ Json compareJson(const CompareAnswer& answer) {
   for (const Comparison& one : answer.comparisons) {
     list.push_back({{"key", one.key.name},
                     {"kind", kindName(one)},
-                    {"unit", unitOf(one.key.name)},
+                    {"unit", catalogue::unitOf(one.key.name)},
                     {"changed", one.isSignificant()},
                     {"before", sideJson(one.before)},
                     {"after", sideJson(one.after)},
@@ -177,7 +172,7 @@ void printCsv(std::ostream& out, const CompareAnswer& answer) {
     value ? csv.real(*value) : csv.nothing();
   };
   for (const Comparison& one : answer.comparisons) {
-    csv.text(one.key.name).title(kindName(one)).title(unitOf(one.key.name));
+    csv.text(one.key.name).title(kindName(one)).title(catalogue::unitOf(one.key.name));
     csv.title(one.isSignificant() ? "true" : "false");
     csv.integer(one.before.devices).integer(one.after.devices);
     csv.integer(one.before.logs).integer(one.after.logs);

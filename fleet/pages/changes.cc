@@ -69,99 +69,25 @@ std::size_t changesOf(const CompareAnswer& comparison) {
                     [](const Comparison& one) { return one.isSignificant(); }));
 }
 
-}  // namespace
-
-std::string nameOf(std::string_view key) {
-  const catalogue::Entry* entry = catalogue::findStatistic(key);
-  if (entry == nullptr || entry->meaning.empty()) return std::string(key);
-  // The rest of the meaning explains the figure further.
-  return std::string(entry->meaning.substr(0, entry->meaning.find_first_of(";:")));
-}
-
-std::string_view unitOf(std::string_view key) {
-  const catalogue::Entry* entry = catalogue::findStatistic(key);
-  return entry == nullptr ? "" : entry->unit;
-}
-
-std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast) {
-  return (logs < devicesAtLeast ? "a few" : countText(logs)) +
-         " logs that have no mean, because some of the values are not finite or lie too far apart";
-}
-
-std::string changeText(const Comparison& one) {
-  const std::string_view unit = unitOf(one.key.name);
-  const double percent = percentOf(one.relative.value_or(0));
-  return (percent != 0 ? page::shortNumber(percent) + " % " : "") +
-         (one.difference > 0 ? "higher" : "lower") + " (" +
-         page::figureText(one.before.mean, unit) + " → " + page::figureText(one.after.mean, unit) +
-         ")";
-}
-
-void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
-  const SummaryAnswer& summary = page.summary;
-  if (!page.comparison) {
-    html.element("p", "No two OS versions have enough devices to be compared.");
-    return;
-  }
-  const CompareAnswer& comparison = *page.comparison;
-  const std::size_t changes = changesOf(comparison);
+/// Of the first of these statistics that enough devices have.
+void writeWear(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers) {
+  const auto shown = std::ranges::find_if(
+      answers, [](const ShowAnswer& answer) { return answer.sides.front().isShown; });
+  if (shown == answers.end() || !shown->sides.front().whole.scalar) return;
+  static_assert(kPercents[2] == 50 && kPercents[4] == 95);
+  const auto& percentiles = shown->sides.front().whole.scalar->percentiles;
+  const std::string_view unit = catalogue::unitOf(shown->request.key);
   html.begin("p");
-  html.text("From ");
-  html.name(comparison.request.oldVersion);
-  html.text(" to ");
-  html.name(comparison.request.newVersion);
-  const std::string compared = counted(comparison.comparisons.size(), "statistic");
-  html.text(changes == 0 ? ", none of " + compared + " changed beyond what chance explains."
-                         : ", " + countText(changes) + " of " + compared + " changed:");
+  html.text("Flash: ");
+  html.name(nameOf(shown->request.key));
+  html.text(" is at most " + page::figureText(static_cast<double>(percentiles[2]), unit) +
+            " in half of the daily logs, and above " +
+            page::figureText(static_cast<double>(percentiles[4]), unit) +
+            " in no more than one of twenty.");
   html.end();
-  if (changes != 0) html.begin("ul");
-  for (std::size_t i = 0; i < std::min(changes, kMostSentences); ++i) {
-    const Comparison& one = comparison.comparisons[i];
-    html.begin("li");
-    html.begin("strong");
-    html.name(labelOf(comparison, one));
-    html.text(": " + changeText(one));
-    html.end();
-    html.text(". This is " + strengthText(one) + ". Chance alone would show such a difference in " +
-              chanceText(one.adjustedPValue) + " comparisons.");
-    html.end();
-  }
-  if (changes > kMostSentences) {
-    html.element("li", "and " + countText(changes - kMostSentences) + " more, listed below.");
-  }
-  if (changes != 0) html.end();
-  const auto wear = std::ranges::find_if(
-      page.wear, [](const ShowAnswer& answer) { return answer.sides.front().isShown; });
-  if (wear != page.wear.end()) {
-    const ShownSet& all = wear->sides.front().whole;
-    const std::string_view unit = unitOf(wear->request.key);
-    if (all.scalar) {
-      html.begin("p");
-      html.text("Flash: ");
-      html.name(nameOf(wear->request.key));
-      html.text(" is at most " +
-                page::figureText(static_cast<double>(all.scalar->percentiles[2]), unit) +
-                " in half of the daily logs, and above " +
-                page::figureText(static_cast<double>(all.scalar->percentiles[4]), unit) +
-                " in no more than one of twenty.");
-      html.end();
-    }
-  }
-  html.element("p",
-               "These figures are of at least " + countText(summary.whole.devices) + " devices.",
-               {{"class", "note"}});
 }
 
-void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
-  html.begin("p");
-  html.name(comparison.request.oldVersion);
-  html.text(" beside ");
-  html.name(comparison.request.newVersion);
-  html.text(
-      ". The dots are the changes of the means in percent, the lines their 95 % confidence "
-      "intervals.");
-  html.end();
-
+void writeChart(page::HtmlWriter& html, const CompareAnswer& comparison) {
   page::IntervalChart chart;
   chart.name = "Changes in percent";
   chart.text = [](double value) { return page::shortNumber(std::round(value * 10) / 10) + " %"; };
@@ -183,7 +109,9 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     html.element("p", counted(unchanged, "more statistic") + " without a change beyond chance.",
                  {{"class", "note"}});
   }
+}
 
+void writeTable(page::HtmlWriter& html, const CompareAnswer& comparison) {
   using Align = page::Table::Align;
   page::Table table(html, "Changes",
                     {{"Statistic", Align::Name},
@@ -194,7 +122,7 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
                      {"Devices", Align::Number}});
   for (const Comparison& one : comparison.comparisons) {
     if (!one.isSignificant()) break;
-    const std::string_view unit = unitOf(one.key.name);
+    const std::string_view unit = catalogue::unitOf(one.key.name);
     table.row();
     table.cell([&](page::HtmlWriter& cell) { cell.name(one.key.name); });
     table.cell(kindText(one.key.kind));
@@ -205,6 +133,9 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
     table.cell(countText(one.before.devices) + " and " + countText(one.after.devices));
   }
   table.end();
+}
+
+void writeLeftOut(page::HtmlWriter& html, const CompareAnswer& comparison) {
   for (const Comparison& one : comparison.comparisons) {
     if (!one.isSignificant() || logsWithoutMean(one) == 0) continue;
     html.begin("p", {{"class", "note"}});
@@ -220,6 +151,83 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
                      " not in both versions, of too few devices, or without a mean.",
                  {{"class", "note"}});
   }
+}
+
+}  // namespace
+
+std::string nameOf(std::string_view key) {
+  const catalogue::Entry* entry = catalogue::findStatistic(key);
+  if (entry == nullptr || entry->meaning.empty()) return std::string(key);
+  // The rest of the meaning explains the figure further.
+  return std::string(entry->meaning.substr(0, entry->meaning.find_first_of(";:")));
+}
+
+std::string withoutMeanText(std::size_t logs, std::size_t devicesAtLeast) {
+  return (logs < devicesAtLeast ? "a few" : countText(logs)) +
+         " logs that have no mean, because some of the values are not finite or lie too far apart";
+}
+
+std::string changeText(const Comparison& one) {
+  const std::string_view unit = catalogue::unitOf(one.key.name);
+  const double percent = percentOf(one.relative.value_or(0));
+  return (percent != 0 ? page::shortNumber(percent) + " % " : "") +
+         (one.difference > 0 ? "higher" : "lower") + " (" +
+         page::figureText(one.before.mean, unit) + " → " + page::figureText(one.after.mean, unit) +
+         ")";
+}
+
+void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
+  const SummaryAnswer& summary = page.summary;
+  if (!page.comparison) {
+    html.element("p", "No two OS versions have enough devices to be compared.");
+    return;
+  }
+  const CompareAnswer& comparison = *page.comparison;
+  const std::size_t changes = changesOf(comparison);
+  html.begin("p");
+  html.text("From ");
+  html.name(comparison.request.oldVersion);
+  html.text(" to ");
+  html.name(comparison.request.newVersion);
+  const std::string compared = counted(comparison.comparisons.size(), "statistic");
+  html.text(comparison.comparisons.empty() ? ", no statistic could be compared."
+            : changes == 0 ? ", none of " + compared + " changed beyond what chance explains."
+                           : ", " + countText(changes) + " of " + compared + " changed:");
+  html.end();
+  if (changes != 0) html.begin("ul");
+  for (std::size_t i = 0; i < std::min(changes, kMostSentences); ++i) {
+    const Comparison& one = comparison.comparisons[i];
+    html.begin("li");
+    html.begin("strong");
+    html.name(labelOf(comparison, one));
+    html.text(": " + changeText(one));
+    html.end();
+    html.text(". This is " + strengthText(one) + ". Chance alone would show such a difference in " +
+              chanceText(one.adjustedPValue) + " comparisons.");
+    html.end();
+  }
+  if (changes > kMostSentences) {
+    html.element("li", "and " + countText(changes - kMostSentences) + " more, listed below.");
+  }
+  if (changes != 0) html.end();
+  writeWear(html, page.wear);
+  html.element("p",
+               "These figures are of at least " + countText(summary.whole.devices) + " devices.",
+               {{"class", "note"}});
+}
+
+void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
+  html.begin("p");
+  html.name(comparison.request.oldVersion);
+  html.text(" beside ");
+  html.name(comparison.request.newVersion);
+  html.text(
+      ". The dots are the changes of the means in percent, the lines their 95 % confidence "
+      "intervals.");
+  html.end();
+  writeChart(html, comparison);
+  writeTable(html, comparison);
+  writeLeftOut(html, comparison);
 }
 
 }  // namespace tavrel::fleet

@@ -1,6 +1,5 @@
 #include "fleet/pages/fleet_page.h"
 
-#include <algorithm>
 #include <set>
 
 #include "base/civil_time.h"

@@ -17,7 +17,6 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
 
 /// The short meaning of a key when it is known, else the key itself.
 std::string nameOf(std::string_view key);
-std::string_view unitOf(std::string_view key);
 /// "20 % higher (120 ms → 144 ms)"; without the percentage when that rounds to 0.
 std::string changeText(const Comparison& one);
 /// "2 logs that have no mean, because ...".

@@ -1,8 +1,8 @@
 // The parts of the fleet, and its statistics by version.
-#include <algorithm>
 #include <cmath>
 
 #include "base/civil_time.h"
+#include "catalogue/catalogue.h"
 #include "fleet/pages/sections.h"
 #include "fleet/questions/merged_numbers.h"
 #include "page/charts.h"
@@ -158,7 +158,7 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
       continue;
     }
     const std::string name = nameOf(answer.request.key);
-    const std::string_view unit = unitOf(answer.request.key);
+    const std::string_view unit = catalogue::unitOf(answer.request.key);
     html.begin("h3");
     html.name(name);
     html.end();

@@ -60,8 +60,6 @@ void writeNotes(PageScene& scene);
 void writeKey(page::HtmlWriter& html, std::string_view key);
 /// Begins a card with a heading. The caller must end it. A long key gets a wide card.
 void beginCard(page::HtmlWriter& html, std::string_view key);
-/// The catalogue's unit for a key; empty when unknown.
-std::string_view unitOf(std::string_view key);
 /// Writes one fact of a list, with outside text; `style` is "good", "warn", "bad" or empty.
 void writeFact(page::HtmlWriter& html, std::string_view term, std::string_view text,
                std::string_view style = {});

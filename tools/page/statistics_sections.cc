@@ -55,7 +55,7 @@ std::vector<ScalarRow> scalarRows(const PageScene& scene) {
 }
 
 void writeScalarRow(page::Table& table, const ScalarRow& row) {
-  const std::string_view unit = unitOf(row.key);
+  const std::string_view unit = catalogue::unitOf(row.key);
   table.row();
   table.cell([&](page::HtmlWriter& cell) { writeKey(cell, row.key); });
   table.cell(row.exact ? shortNumber(*row.exact) : "not kept");
@@ -139,7 +139,7 @@ void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) 
 
 void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summary& summary,
                        const DayValues& values, const DistributionView* leaving) {
-  const std::string_view unit = unitOf(key);
+  const std::string_view unit = catalogue::unitOf(key);
   beginCard(html, key);
   writeKey(html, key);
   html.end();
@@ -174,11 +174,6 @@ void beginCard(page::HtmlWriter& html, std::string_view key) {
   constexpr std::size_t kWide = 120;
   html.begin("article", {{"class", key.size() > kWide ? "card wide" : "card"}});
   html.begin("h3");
-}
-
-std::string_view unitOf(std::string_view key) {
-  const auto* entry = catalogue::findStatistic(key);
-  return entry ? entry->unit : std::string_view();
 }
 
 void writeScalars(PageScene& scene) {

@@ -4,6 +4,7 @@
 #include <set>
 
 #include "base/format.h"
+#include "catalogue/catalogue.h"
 #include "page/charts.h"
 #include "page/number_text.h"
 #include "page/table.h"
@@ -73,7 +74,7 @@ Values valuesOf(const RecordedDays& recorded, const Trend& trend) {
 }
 
 void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& trend) {
-  const std::string_view unit = unitOf(trend.key);
+  const std::string_view unit = catalogue::unitOf(trend.key);
   beginCard(html, trend.key);
   writeKey(html, trend.key);
   html.end();
@@ -94,7 +95,7 @@ void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& tre
 }
 
 void writeRow(const RecordedDays& recorded, page::Table& table, const Trend& trend) {
-  const std::string_view unit = unitOf(trend.key);
+  const std::string_view unit = catalogue::unitOf(trend.key);
   std::size_t told = 0;
   double low = 0, high = 0, last = 0;
   for (const auto& value : valuesOf(recorded, trend)) {
