@@ -2,7 +2,8 @@
 #include <filesystem>
 #include <fstream>
 #include <iostream>
-#include <memory>
+#include <random>
+#include <stdexcept>
 #include <string>
 #include <vector>
 

@@ -1,6 +1,5 @@
 #include "fleet/loading/permitted_keys.h"
 
-#include <utility>
 #include <vector>
 
 #include "base/format.h"

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <optional>
-#include <string>
 
 #include "fleet/loading/permitted_keys.h"
 #include "fleet/logs/log_reader.h"

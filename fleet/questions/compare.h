@@ -7,7 +7,6 @@
 // guarantee: its true uncertainty is no larger, whatever the logs of a device have in common.
 #pragma once
 
-#include <cstdint>
 #include <optional>
 #include <string>
 #include <vector>

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <bit>
 #include <cmath>
-#include <compare>
 #include <vector>
 
 namespace tavrel::fleet {

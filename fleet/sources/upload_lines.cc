@@ -1,7 +1,6 @@
 #include "fleet/sources/upload_lines.h"
 
 #include <array>
-#include <cerrno>
 #include <cstdint>
 #include <memory>
 #include <nlohmann/json.hpp>

@@ -1,7 +1,6 @@
 #include "fleet/engine/clickhouse/native_block.h"
 
 #include <bit>
-#include <utility>
 
 namespace tavrel::fleet {
 namespace {

@@ -2,8 +2,6 @@
 #pragma once
 
 #include <bit>
-#include <concepts>
-#include <cstdint>
 #include <string>
 #include <string_view>
 #include <type_traits>

@@ -1,7 +1,6 @@
 // A ClickHouse server, reached over HTTP.
 #pragma once
 
-#include <cstdint>
 #include <functional>
 #include <string>
 #include <string_view>
