@@ -35,9 +35,10 @@ std::string_view withoutGzip(std::string_view name) {
 }
 
 std::string sidecarOf(std::string_view logPath) {
-  std::string_view name = withoutGzip(logPath);
-  name = name.substr(0, name.rfind('.'));
-  return std::string(name).append(kMetadataEnding);
+  const std::string_view path = withoutGzip(logPath);
+  const std::string_view name = fileNameOf(path);
+  const std::size_t dot = std::min(name.rfind('.'), name.size());
+  return std::string(path.substr(0, path.size() - name.size() + dot)).append(kMetadataEnding);
 }
 
 std::string_view fileNameOf(std::string_view path) {

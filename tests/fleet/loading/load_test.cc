@@ -124,6 +124,16 @@ TEST_F(LoadTest, TakesAnOutbox) {
             "  \"others\": 2\n}\n");
 }
 
+TEST_F(LoadTest, TakesMetadataOnlyFromBesideTheLog) {
+  write("a/x.d/mylog", sampleLog(1));
+  write("a/x.metadata.plist", kMetadata);
+  write("a/x.d/other", sampleLog(2));
+  write("a/x.d/other.metadata.plist", kMetadata);
+  EXPECT_EQ(run({at("a/x.d/mylog"), at("a/x.d/other")}).status, 0);
+  EXPECT_EQ(versions(),
+            (std::multiset<std::string>{"1|||", "2|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7"}));
+}
+
 TEST_F(LoadTest, TakesAServersUploads) {
   const std::string name = "log-tallied-20261127T180218Z-5f0c9a1e.log";
   write("srv/device-7/" + name + ".gz", gzipped(sampleLog(7)));
