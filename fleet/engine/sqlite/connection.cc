@@ -24,8 +24,10 @@ const char* adviceFor(int code, bool writes) {
     case SQLITE_FULL:
       return "free some space in its file system";
     case SQLITE_READONLY:
-      if (!writes) return "make its folder writable for readers, or query a copy";
-      [[fallthrough]];
+      return writes ? "check the owner of the file, and of those beside it whose names go on with "
+                      "-wal and -shm"
+                    : "load a log as its owner, which makes the files that readers need, or query "
+                      "a copy";
     case SQLITE_CANTOPEN:
     case SQLITE_PERM:
     case SQLITE_AUTH:
@@ -56,6 +58,10 @@ Connection::Connection(const std::string& path, bool writes) : path_(path), writ
   handle_.reset(handle);
   if (code != SQLITE_OK) fail(code);
   sqlite3_busy_timeout(handle, kBusyMilliseconds);
+  // The log and its index stay when the last loader ends. A reader would have to make them, which
+  // needs a writable folder and keeps loaders of another user out.
+  int persists = 1;
+  if (writes) sqlite3_file_control(handle, nullptr, SQLITE_FCNTL_PERSIST_WAL, &persists);
 }
 
 void Connection::fail(int code) const {

@@ -125,7 +125,12 @@ Connection openFile(const std::string& path, bool writes) {
   }
   if (version == 0) throw EngineError(nothing);
   checkVersion(path, version);
-  if (writes) connection.execute("PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL");
+  if (writes) {
+    // With a limit of its size, the log that stays is empty.
+    connection.execute(
+        "PRAGMA journal_mode = WAL; PRAGMA synchronous = FULL; PRAGMA journal_size_limit = "
+        "67108864");
+  }
   connection.execute("PRAGMA cache_size = -32768; PRAGMA mmap_size = 2147418112");
   return connection;
 }
