@@ -44,11 +44,14 @@ void printCounts(FleetContext& context, const LoadCounts& counts) {
     return context.printJson({{"loaded", counts.loaded},
                               {"known", counts.known},
                               {"refused", counts.refused},
-                              {"others", counts.others}});
+                              {"others", counts.others},
+                              {"without_metadata", counts.withoutMetadata}});
   }
   context.out() << format("%zu loaded, %zu known, %zu refused", counts.loaded, counts.known,
                           counts.refused);
   if (counts.others != 0) context.out() << format("; %zu of another kind", counts.others);
+  if (counts.withoutMetadata != 0)
+    context.out() << format("; %zu without metadata", counts.withoutMetadata);
   context.out() << '\n';
 }
 

@@ -34,6 +34,7 @@ class Loading {
   /// `isMoreRead`: whether another item is available without waiting.
   Status take(ReadItem item, bool isMoreRead) {
     if (item.record) {
+      if (!item.source.metadata) ++counts_.withoutMetadata;
       batch_.push_back(*std::move(item.record));
       batchBytes_ += item.bytes;
       if (batch_.size() == kBatchLogs || batchBytes_ >= kBatchBytes ||
@@ -91,8 +92,9 @@ Expected<LoadCounts> load(Engine& engine, const LoadRequest& request,
     const auto useless = lines.read(path);
     if (!useless) return useless.error();
     if (*useless != 0) {
-      listener.note(
-          format("%s: %zu lines ignored: they report no successful upload", path, *useless));
+      listener.note(format("%s: %zu %s", path, *useless,
+                           *useless == 1 ? "line ignored: it reports no successful upload"
+                                         : "lines ignored: they report no successful upload"));
     }
   }
   Loading loading(engine, request, listener);

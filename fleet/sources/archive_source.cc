@@ -113,7 +113,8 @@ std::size_t bytesOf(const Sidecars::value_type& sidecar) {
                   : bytes + metadata.error().message.size();
 }
 
-Expected<Sidecars> readSidecars(const std::string& path) {
+// `isWhole`: whether the archive could be read to its end.
+Expected<Sidecars> readSidecars(const std::string& path, bool& isWhole) {
   Sidecars sidecars;
   std::size_t kept = 0;
   Archive archive(path);
@@ -133,6 +134,7 @@ Expected<Sidecars> readSidecars(const std::string& path) {
                           limits::kKeptMetadataBytes)};
     }
   }
+  isWhole = archive.failure().empty();
   return sidecars;
 }
 
@@ -157,7 +159,8 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
     item.reason = reason;
     sink(std::move(item));
   };
-  const Expected<Sidecars> sidecars = readSidecars(path);
+  bool isWhole = false;
+  const Expected<Sidecars> sidecars = readSidecars(path, isWhole);
   if (!sidecars) return refuse(sidecars.error().message);
   Archive archive(path);
   while (archive_entry* const entry = archive.next()) {
@@ -176,8 +179,14 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
     if (isOtherLog(withoutGzip(fileNameOf(name)), item.metadata ? &*item.metadata : nullptr)) {
       item.kind = Kind::kOther;
     } else if (archive.read(limits::kLogBytes, item.content)) {
-      item.kind = metadata ? Kind::kContent : Kind::kRefused;
-      if (!metadata) item.reason = "its metadata: " + metadata.error().message;
+      item.kind = Kind::kRefused;
+      if (!metadata) {
+        item.reason = "its metadata: " + metadata.error().message;
+      } else if (!isWhole && !item.metadata) {
+        item.reason = "its metadata may be in the rest of the archive";
+      } else {
+        item.kind = Kind::kContent;
+      }
     } else if (archive.failure().empty()) {
       item.kind = Kind::kRefused;
       item.content.clear();

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cerrno>
 #include <fcntl.h>
+#include <filesystem>
 #include <sys/stat.h>
 #include <utility>
 #include <vector>
@@ -67,6 +68,16 @@ struct Entry {
   FileType type;
 };
 
+/// The name of the folder with the file, which for uploads is the device's. A path such as
+/// "./a.log" leaves it out.
+std::string holderOf(const std::string& path) {
+  const std::string_view name = folderNameOf(path);
+  if (!name.empty() && name != "." && name != "..") return std::string(name);
+  std::error_code unknown;
+  const auto folder = std::filesystem::absolute(path, unknown).parent_path();
+  return std::filesystem::canonical(folder, unknown).filename();
+}
+
 class Visit {
  public:
   Visit(const UploadLines& lines, const SourceSink& sink, const std::optional<std::string>& leftOut)
@@ -101,7 +112,7 @@ class Visit {
     item.name = item.path = path;
     item.hasSidecar = hasSidecar;
     const std::string_view name = withoutGzip(fileNameOf(path));
-    const LogMetadata* const line = lines_.find(folderNameOf(path), name);
+    const LogMetadata* const line = lines_.find(holderOf(path), name);
     if (line != nullptr && !hasSidecar) item.metadata = *line;
     // With a sidecar, the thread that reads it decides.
     if (!hasSidecar && isOtherLog(name, line)) item.kind = Kind::kOther;

@@ -112,7 +112,7 @@ TEST_F(LoadTest, TakesAnOutbox) {
   write("outbox/.tavrel-0123456789012345.tmp", "unfinished");
   const Outcome first = run({at("outbox")});
   EXPECT_EQ(first.error, "");
-  EXPECT_EQ(first.out, "2 loaded, 0 known, 0 refused; 2 of another kind\n");
+  EXPECT_EQ(first.out, "2 loaded, 0 known, 0 refused; 2 of another kind; 1 without metadata\n");
   EXPECT_EQ(first.status, 0);
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
@@ -121,7 +121,7 @@ TEST_F(LoadTest, TakesAnOutbox) {
   write("again/b.plist", sampleLog(2));
   EXPECT_EQ(run({at("again"), at("outbox"), "--json"}).out,
             "{\n  \"format_version\": 1,\n  \"loaded\": 0,\n  \"known\": 4,\n  \"refused\": 0,\n"
-            "  \"others\": 2\n}\n");
+            "  \"others\": 2,\n  \"without_metadata\": 3\n}\n");
 }
 
 TEST_F(LoadTest, TakesMetadataOnlyFromBesideTheLog) {
@@ -157,9 +157,14 @@ TEST_F(LoadTest, TakesAServersUploads) {
       run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
   EXPECT_EQ(outcome.error,
             "tavrel-fleet: lines.log: 2 lines ignored: they report no successful upload\n");
-  EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind\n");
+  EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind; 1 without metadata\n");
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||"}));
+  const std::filesystem::path before = std::filesystem::current_path();
+  std::filesystem::current_path(at("srv/device-7"));
+  for (const std::string& path : {std::string("."), std::string("./"), name + ".gz"})
+    EXPECT_EQ(run({path, "--metadata", at("lines.log")}).out, "0 loaded, 1 known, 0 refused\n");
+  std::filesystem::current_path(before);
 }
 
 TEST_F(LoadTest, TakesArchives) {
@@ -176,7 +181,7 @@ TEST_F(LoadTest, TakesArchives) {
       at(""));
   ASSERT_EQ(std::system(pack.c_str()), 0);
   const Outcome outcome = run({at("all.tar")});
-  EXPECT_EQ(outcome.out, "2 loaded, 0 known, 2 refused\n");
+  EXPECT_EQ(outcome.out, "2 loaded, 0 known, 2 refused; 1 without metadata\n");
   EXPECT_EQ(outcome.status, 1);
   EXPECT_NE(outcome.error.find("refused: all.tar: d/e.log: its metadata: "), std::string::npos);
   EXPECT_NE(outcome.error.find("skipped: all.tar: d/link.log: is not a regular file\n"),
@@ -186,11 +191,22 @@ TEST_F(LoadTest, TakesArchives) {
             std::string::npos);
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"1|Pellio 4.2 (16R349)|Pellio 4.1 (16Q1)|CFG-7", "2|||"}));
-  EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 2 refused\n");
+  EXPECT_EQ(run({at("all.tgz")}).out, "0 loaded, 2 known, 2 refused; 1 without metadata\n");
   const Outcome cut = run({at("cut.tar")});
   EXPECT_NE(cut.error.find("refused: cut.tar: the rest cannot be read: "), std::string::npos)
       << cut.error;
   EXPECT_EQ(cut.status, 1);
+  write("first.log", sampleLog(5));
+  write("first.metadata.plist", kMetadata);
+  const std::size_t content = (sampleLog(5).size() + 511) / 512 * 512;
+  const std::string early = format(
+      "cd %s && tar -cf early.tar first.log first.metadata.plist && head -c %zu early.tar > e.tar",
+      at(""), 512 + content + 100);
+  ASSERT_EQ(std::system(early.c_str()), 0);
+  EXPECT_NE(run({at("e.tar")})
+                .error.find(
+                    "refused: e.tar: first.log: its metadata may be in the rest of the archive\n"),
+            std::string::npos);
   // A file of one gigabyte in an archive of a few kilobytes.
   const std::string bomb =
       format("cd %s && truncate -s 1G big.log && tar -cSf bomb.tar big.log", at(""));
@@ -273,7 +289,7 @@ TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
       "permit the key\n"
       "tavrel-fleet: refused: in/3.log: its whitelist \"eb42570d2e2f7addc42403d203dafde4\" is "
       "not among those given\n");
-  EXPECT_EQ(outcome.out, "1 loaded, 0 known, 2 refused\n");
+  EXPECT_EQ(outcome.out, "1 loaded, 0 known, 2 refused; 1 without metadata\n");
   EXPECT_EQ(run({at("in"), "--whitelist", at("none.plist")}).error,
             "tavrel-fleet: whitelist none.plist: cannot be read: No such file or directory\n");
 }
@@ -281,7 +297,8 @@ TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
 TEST_F(LoadTest, LosesNothingAndCountsNothingTwiceWhenKilled) {
   constexpr int kLogs = 600;
   writeMany(kLogs);
-  ASSERT_EQ(run({at("many")}).out, format("%d loaded, 0 known, 0 refused\n", kLogs));
+  ASSERT_EQ(run({at("many")}).out,
+            format("%d loaded, 0 known, 0 refused; %d without metadata\n", kLogs, kLogs));
   const auto expected = everything();
   const std::multiset<std::string> all = {std::to_string(kLogs)};
   int killedMidway = 0;
