@@ -5,6 +5,7 @@
 #include <nlohmann/json.hpp>
 #include <ostream>
 
+#include "base/text.h"
 #include "catalogue/catalogue.h"
 #include "fleet/commands/csv_writer.h"
 #include "fleet/commands/question.h"
@@ -47,9 +48,10 @@ Figures figuresOf(const ShownSet& set) {
 
 std::string intervalText(const Interval& interval) {
   if (std::isinf(interval.lower) && std::isinf(interval.upper)) return "?";
-  if (std::isinf(interval.lower)) return "≤ " + shortNumber(interval.upper);
-  if (std::isinf(interval.upper)) return "> " + shortNumber(interval.lower);
-  return shortNumber(interval.lower) + " to " + shortNumber(interval.upper);
+  // Shortened, two ends could look alike.
+  if (std::isinf(interval.lower)) return "≤ " + numberText(interval.upper);
+  if (std::isinf(interval.upper)) return "> " + numberText(interval.lower);
+  return numberText(interval.lower) + " to " + numberText(interval.upper);
 }
 
 std::string percentileText(const ShownSet& set, std::size_t index) {
@@ -91,14 +93,16 @@ void printFigures(FleetContext& context, const ShowSide& side, std::size_t devic
   Table table(std::move(columns), 2);
   forEachSet(side, [&](const ShownSet& set) {
     const Figures figures = figuresOf(set);
-    std::vector<Table::Cell> cells = {set.name.text(),
-                                      std::to_string(set.devices),
-                                      std::to_string(set.logs),
-                                      std::to_string(figures.values),
-                                      figureText(figures.minimum),
-                                      figureText(figures.mean),
-                                      figureText(figures.maximum),
-                                      figures.deviation ? shortNumber(*figures.deviation) : "-"};
+    const bool isScalar = set.scalar.has_value();
+    std::vector<Table::Cell> cells = {
+        set.name.text(),
+        std::to_string(set.devices),
+        std::to_string(set.logs),
+        std::to_string(figures.values),
+        isScalar ? std::to_string(set.scalar->minimum) : figureText(figures.minimum),
+        figureText(figures.mean),
+        isScalar ? std::to_string(set.scalar->maximum) : figureText(figures.maximum),
+        figures.deviation ? shortNumber(*figures.deviation) : "-"};
     for (std::size_t i = 0; hasPercentiles && i < kPercents.size(); ++i)
       cells.push_back(percentileText(set, i));
     cells.push_back(std::to_string(figures.logsWithoutMean));
@@ -199,8 +203,8 @@ void addNames(CsvWriter& csv, const ShowAnswer& answer, const ShowSide& side, co
 }  // namespace
 
 std::string bucketText(double lower, double upper) {
-  return "(" + (std::isinf(lower) ? "-inf" : shortNumber(lower)) + ", " +
-         (std::isinf(upper) ? "inf)" : shortNumber(upper) + "]");
+  return "(" + (std::isinf(lower) ? "-inf" : numberText(lower)) + ", " +
+         (std::isinf(upper) ? "inf)" : numberText(upper) + "]");
 }
 
 const char* kindText(const ShowAnswer& answer) {

@@ -8,6 +8,7 @@
 #include <sstream>
 
 #include "fleet/commands/csv_writer.h"
+#include "fleet/commands/show_output.h"
 #include "fleet/fleet_tool.h"
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
@@ -255,6 +256,11 @@ TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
     EXPECT_EQ(contentOf(folder + "/asked"), "--database h:1/d completion versions\n") << shell;
   }
   if (tried == 0) GTEST_SKIP() << "neither fish nor zsh";
+}
+
+TEST(ShowOutputTest, KeepsTheEndsOfBucketsApart) {
+  EXPECT_EQ(bucketText(12345678900, 12345678901), "(12345678900, 12345678901]");
+  EXPECT_EQ(bucketText(0.1, 0.30000000000000004), "(0.1, 0.30000000000000004]");
 }
 
 TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
