@@ -4,6 +4,7 @@
 #include <charconv>
 #include <unordered_map>
 
+#include "base/arithmetic.h"
 #include "base/ascii.h"
 #include "base/format.h"
 
@@ -72,9 +73,7 @@ std::int64_t scaledNumber(std::string_view text, Scale scale) {
 }
 
 std::int64_t saturatingSum(std::int64_t a, std::int64_t b) {
-  std::int64_t sum = 0;
-  if (!__builtin_add_overflow(a, b, &sum) && sum != kUnset) return sum;
-  return a < 0 ? -INT64_MAX : INT64_MAX;
+  return std::max(saturatingAdd(a, b), -INT64_MAX);
 }
 
 std::string_view takeWord(std::string_view& text) {

@@ -22,13 +22,6 @@ constexpr int kCellAttempts = 8;
 // Chunks per system call.
 constexpr std::uint32_t kChunksAtOnce = 16;
 
-std::int64_t saturatingAdd(std::int64_t a, std::int64_t b) {
-  std::int64_t sum;
-  if (!__builtin_add_overflow(a, b, &sum)) return sum;
-  return b < 0 ? std::numeric_limits<std::int64_t>::min()
-               : std::numeric_limits<std::int64_t>::max();
-}
-
 std::int64_t clockSeconds(clockid_t clock) {
   timespec now{};
   clock_gettime(clock, &now);
