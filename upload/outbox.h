@@ -1,9 +1,7 @@
 // The folders of submitted logs, for the program that empties them.
-//
-// A log is removed before its metadata, so that every log that can be seen has its metadata.
 #pragma once
 
-#include <cstddef>
+#include <compare>
 #include <cstdint>
 #include <functional>
 #include <string>
@@ -13,12 +11,15 @@
 #include "base/expected.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/log_folder.h"
 
 namespace tavrel::upload {
 
 struct WaitingLog {
   std::int64_t filed;  // seconds since 1970, UTC
   std::string name;    // of its file, without the extension
+
+  auto operator<=>(const WaitingLog&) const = default;
 };
 
 class Outbox {
@@ -27,10 +28,10 @@ class Outbox {
 
   /// The folder that contains all the others.
   const std::string& folder() const { return folder_; }
-  std::string logPath(std::string_view name) const;
-  std::string metadataPath(std::string_view name) const;
+  std::string logPath(std::string_view name) const { return outbox_.logPath(name); }
+  std::string metadataPath(std::string_view name) const { return outbox_.metadataPath(name); }
 
-  /// The logs in the outbox, oldest first. Opens no file. Removes metadata whose log is gone.
+  /// The logs in the outbox, oldest first. Opens no file. Removes metadata without its log.
   Expected<std::vector<WaitingLog>> logs();
 
   /// Moves waiting logs from pending/ to the outbox as long as `mayMove` returns true; it is called
@@ -39,27 +40,21 @@ class Outbox {
   Status takePending(const std::function<bool()>& mayMove);
 
   /// Removes a log from the outbox. It may already be gone.
-  Status remove(std::string_view name);
+  Status remove(const std::string& name);
 
   /// Moves a log from the outbox to refused/, which keeps the newest `limits::kRefusedLogs` logs of
-  /// at most `limits::kRefusedBytes` in total.
-  Status refuse(std::string_view name);
+  /// at most `limits::kRefusedBytes` in total, and this log in any case.
+  Status refuse(const std::string& name, std::int64_t today);
 
-  /// Removes all waiting logs, also those in pending/, and adds their number to `count`. A log that
-  /// cannot be removed does not stop the others; the first failure is returned.
-  Status removeAll(std::size_t& count);
+  /// Removes all waiting logs, also those in pending/.
+  RemovedLogs removeAll();
 
  private:
-  std::string path(std::string_view place, std::string_view name, std::string_view ending) const;
-  Expected<std::vector<WaitingLog>> logsIn(std::string_view place,
-                                           std::vector<std::string>& orphans);
-  /// The caller must hold the folder's lock.
-  Status move(std::string_view name, std::string_view from, std::string_view to);
-  Status removeFrom(std::string_view place, std::string_view name);
-  Status boundRefused();
-
   std::string folder_;
   FileSystem& files_;
+  LogFolder pending_;
+  LogFolder outbox_;
+  LogFolder refused_;
 };
 
 }  // namespace tavrel::upload

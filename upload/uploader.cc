@@ -16,6 +16,7 @@
 #include "base/limits.h"
 #include "base/version.h"
 #include "platform/linux/files/random.h"
+#include "platform/linux/files/stamp.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/logs/log_day.h"
 #include "platform/linux/logs/log_file_name.h"
@@ -230,10 +231,10 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   const std::chrono::milliseconds left = timeLeft();
   if (left <= std::chrono::milliseconds(0)) return stopAtLimit();
   tried_ = true;
-  const auto answer =
-      connection_->put(configuration_.url + "/" + log.name + ".log", headers, packed.content,
-                       std::min<std::chrono::milliseconds>(configuration_.transfer, left),
-                       [&] { return askPermission(day) == Step::Next; });
+  const auto answer = connection_->put(
+      format("%s/%s%s", configuration_.url, log.name, kLogEnding), headers, packed.content,
+      std::min<std::chrono::milliseconds>(configuration_.transfer, left),
+      [&] { return askPermission(day) == Step::Next; });
   if (answer) return judge(log, *answer, packed);
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
   if (connection_->isMisconfigured()) {
@@ -328,7 +329,8 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
 Uploader::Step Uploader::giveUp(const WaitingLog& log, long status) {
   services_.log.log(LogLevel::Error, "the server refuses log %s (%ld): it is kept in %s/refused",
                     log.name, status, outbox_.folder());
-  if (Status moved = outbox_.refuse(log.name); !moved) return failToMove(moved.error());
+  if (Status moved = outbox_.refuse(log.name, dayOf(services_.clock.now())); !moved)
+    return failToMove(moved.error());
   ++refused_;
   ++state_.refused;
   succeed();
@@ -367,15 +369,14 @@ void Uploader::fail(std::string line, std::int64_t serverWish) {
 }
 
 Outcome Uploader::removeWaiting() {
-  std::size_t count = 0;
-  const Status removed = outbox_.removeAll(count);
-  if (!removed) complain(removed.error().message);
-  if (count > 0) {
+  const RemovedLogs removed = outbox_.removeAll();
+  if (removed.failure) complain(removed.failure->message);
+  if (removed.logs > 0) {
     services_.log.log(LogLevel::Default,
                       "the permission to send logs was withdrawn; waiting logs removed: %llu",
-                      std::uint64_t{count});
+                      std::uint64_t{removed.logs});
   }
-  return removed ? Outcome::Done : Outcome::Failed;
+  return removed.failure ? Outcome::Failed : Outcome::Done;
 }
 
 }  // namespace tavrel::upload

@@ -92,7 +92,7 @@ TEST_F(LockTest, AnotherUserHindersNoProgram) {
   EXPECT_EQ(count(root.path(kSubmission + "/outbox")), 2);
   EXPECT_EQ(device.submission().removeWaiting().logs, 1U);
 
-  EXPECT_EQ(Tidy(root, files, coding, clock, platform.preferences, device.store()).run().failures,
+  EXPECT_EQ(Tidy(root, files, coding, platform.preferences, device.store()).run().failures,
             Lines{});
   std::array<std::byte, kEccEventBytes> buffer{};
   EccEvents queue(root, files, coding, log, EccEvents::Mode::Consume);

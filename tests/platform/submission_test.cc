@@ -76,8 +76,6 @@ TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
   device.write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
   const std::string orphan = "/var/mobile/Library/Logs/Submission/pending/old.metadata.plist";
   device.write(orphan, "left by a process that was killed");
-  fs::last_write_time(device.root.path(orphan),
-                      fs::file_time_type::clock::now() - std::chrono::hours(25));
   Service service(device.root);
   ASSERT_TRUE(service.file("log-tallied", {{"previous_os_version", "<unknown>"}}));
   service.clock.time = plist::Date::since1970(1'795'802'600);
@@ -216,8 +214,10 @@ TEST(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
   const TemporaryRoot device;
   Service service(device.root);
   for (int i = 0; i < 10; ++i) {
-    // In the end the clock is lost.
-    service.clock.time = plist::Date::since1970(i < 9 ? 1'795'802'538 + i : 5);
+    // At first the clock is ahead, in the end it is lost.
+    service.clock.time = plist::Date::since1970(i == 0  ? 2'114'380'800
+                                                : i < 9 ? 1'795'802'538 + i
+                                                        : 5);
     ASSERT_TRUE(service.writeLog("S"));
   }
   const auto logs = *service.submission.logs(Place::Withheld);

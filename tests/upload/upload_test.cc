@@ -192,6 +192,19 @@ TEST(Upload, GivesUpWhatTheServerRefusesAndKeepsTheNewest) {
   EXPECT_EQ(device.names().size(), 2U);
 }
 
+TEST(Upload, KeepsARefusedLogBesideThoseOfAClockThatWasAhead) {
+  Device device;
+  for (int second = 10; second < 26; ++second)
+    device.add(format("log-tallied-20370101T0000%dZ-5f0c9a1e", second), "refused/");
+  device.add(nameOf(1));
+  const ScriptedServer server([](const std::string&) { return status("422 Unfit"); });
+  EXPECT_EQ(device.runAgainst(server), Outcome::Done);
+  const Lines names = device.names("refused");
+  ASSERT_EQ(names.size(), 2 * 16U);
+  EXPECT_EQ(names[0], nameOf(1) + ".log");
+  EXPECT_EQ(names[2], "log-tallied-20370101T000011Z-5f0c9a1e.log");
+}
+
 TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
   for (const std::string value : {"<false/>", "<string>yes</string>", ""}) {
     Device device;
@@ -215,14 +228,14 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
   }
   Device obstructed;
   obstructed.permit("<false/>");
-  obstructed.write(kSubmission + "pending/a.log/x", "");
+  obstructed.write(kSubmission + "pending", "");
   obstructed.add(nameOf(1));
   EXPECT_EQ(obstructed.run(), Outcome::Failed);
   EXPECT_EQ(obstructed.names(), Lines{});
-  EXPECT_EQ(obstructed.log.lines,
-            (Lines{"cannot use " + obstructed.root.path(kSubmission + "pending/a.log") +
-                       ": it is a folder; move it away",
-                   "the permission to send logs was withdrawn; waiting logs removed: 1"}));
+  EXPECT_EQ(
+      obstructed.log.lines,
+      (Lines{"cannot list " + obstructed.root.path(kSubmission + "pending") + ": Not a directory",
+             "the permission to send logs was withdrawn; waiting logs removed: 1"}));
   const std::tuple<const char*, const char*, std::size_t, std::string> changes[] = {
       {"<false/>", "", 0, "the permission to send logs was withdrawn; waiting logs removed: 1"},
       {"<true/>", "<integer>20785</integer>", 2,

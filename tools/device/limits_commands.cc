@@ -19,8 +19,7 @@ namespace {
 Tidy tidyOf(ToolContext& context, SqliteStore& store) {
   LinuxPlatform& device = context.linuxPlatform();
   Platform& platform = device.platform();
-  return {device.root(),  device.fileSystem(),   platform.propertyLists,
-          platform.clock, context.preferences(), store};
+  return {device.root(), device.fileSystem(), platform.propertyLists, context.preferences(), store};
 }
 
 Json jsonOfDays(std::int64_t days) {

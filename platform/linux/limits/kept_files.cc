@@ -6,14 +6,11 @@
 
 #include "base/civil_time.h"
 #include "base/limits.h"
-#include "platform/linux/logs/file_submission.h"
-#include "platform/linux/logs/log_file_name.h"
 #include "platform/linux/logs/record_file_name.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kSubmissionFolder = "/var/mobile/Library/Logs/Submission";
 constexpr std::string_view kEventFolder = "/var/lib/tavrel/ecc-events";
 constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold",
                                                  "/var/mobile/Library/Preferences", kEventFolder};
@@ -22,13 +19,13 @@ constexpr std::int64_t kBlockBytes = 4096;
 std::string_view folderOf(Kept kind) {
   switch (kind) {
     case Kept::Pending:
-      return "/pending";
+      return kPendingFolder;
     case Kept::Outbox:
-      return "/outbox";
+      return kOutboxFolder;
     case Kept::Withheld:
-      return "/withheld";
+      return kWithheldFolder;
     default:
-      return "/refused";
+      return kRefusedFolder;
   }
 }
 
@@ -77,13 +74,12 @@ Expected<KeptFiles> KeptFiles::list(Kept kind, const DeviceRoot& root, FileSyste
       }
       break;
     default:
-      kept.folder_ = root.path(std::string(kSubmissionFolder).append(folderOf(kind)));
-      listed = kept.listLogs();
+      listed = kept.listLogs({root.path(kSubmissionFolder), folderOf(kind), files});
       break;
   }
   if (!listed) return listed.error();
   std::ranges::sort(kept.list_, {}, [today](const KeptFile& file) {
-    return std::tuple(!isAhead(file.day(), today), file.seconds, std::string_view(file.path));
+    return removalKey(file.seconds, file.path, today);
   });
   return kept;
 }
@@ -95,26 +91,18 @@ void KeptFiles::add(const std::string& path, std::int64_t seconds) {
   list_.push_back({path, {}, seconds, blocksOf(*status)});
 }
 
-Status KeptFiles::listLogs() {
-  const auto names = fileSystem_.list(folder_);
-  if (!names) return names.error();
-  for (const std::string& name : *names) {
-    if (name.ends_with(kLogMetadataEnding)) {
-      std::string log = name.substr(0, name.size() - kLogMetadataEnding.size());
-      log += kLogEnding;
-      if (!std::ranges::binary_search(*names, log)) orphans_.push_back(folder_ + '/' + name);
-    }
-    if (!name.ends_with(kLogEnding)) continue;
-    const std::string stem = name.substr(0, name.size() - kLogEnding.size());
-    const std::string path = folder_ + '/' + name;
-    const auto status = FileSystem::status(path);
+Status KeptFiles::listLogs(const LogFolder& folder) {
+  folder_ = folder.path();
+  const auto listing = folder.list();
+  if (!listing) return listing.error();
+  for (const std::string& name : listing->orphans)
+    orphans_.push_back(folder.metadataPath(name));
+  for (const std::string& name : listing->logs) {
+    const auto status = FileSystem::status(folder.logPath(name));
     if (!status || !S_ISREG(status->st_mode)) continue;
-    const auto known = parseLogFileName(stem);
-    list_.push_back({path, folder_ + '/' + stem,
-                     known ? known->seconds : std::int64_t{status->st_mtim.tv_sec},
-                     blocksOf(*status)});
+    list_.push_back(
+        {folder.logPath(name), folder.metadataPath(name), folder.timeOf(name), blocksOf(*status)});
     KeptFile& log = list_.back();
-    log.companion += kLogMetadataEnding;
     if (const auto metadata = FileSystem::status(log.companion)) log.bytes += blocksOf(*metadata);
   }
   return Done{};
@@ -175,8 +163,9 @@ bool KeptFiles::stays(std::size_t index) const {
   }
 }
 
-TrimmedFiles KeptFiles::trim(const Bounds& bounds, std::int64_t now) {
-  removeOrphans(now);
+TrimmedFiles KeptFiles::trim(const Bounds& bounds) {
+  for (const std::string& path : orphans_)
+    fileSystem_.discard(path);
   TrimmedFiles trimmed;
   KeptUse left = use();
   std::vector<std::string> companions;
@@ -213,15 +202,6 @@ Status KeptFiles::removeCompanions(const std::vector<std::string>& companions) {
   for (const std::string& companion : companions)
     fileSystem_.discard(companion);
   return Done{};
-}
-
-void KeptFiles::removeOrphans(std::int64_t now) {
-  for (const std::string& path : orphans_) {
-    const auto status = FileSystem::status(path);
-    if (status && now - status->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
-      fileSystem_.discard(path);
-    }
-  }
 }
 
 }  // namespace tavrel

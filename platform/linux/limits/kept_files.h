@@ -8,20 +8,15 @@
 
 #include <cstdint>
 #include <string>
-#include <tuple>
 #include <vector>
 
 #include "base/expected.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/limits/device_limits.h"
+#include "platform/linux/logs/log_folder.h"
 
 namespace tavrel {
-
-/// True for a day in the future: it was recorded while the clock was ahead.
-constexpr bool isAhead(std::int64_t day, std::int64_t today) {
-  return day > today + 1;
-}
 
 /// The unit of removal: a log with its metadata, or one file.
 struct KeptFile {
@@ -58,29 +53,27 @@ class KeptFiles {
 
   /// Removes what exceeds the bounds. In place of a file that cannot be removed, the next ones go.
   /// The newest log, and the records of `today`, always stay. Also
-  /// removes metadata that a killed process left without its log, when it was last changed more
-  /// than a day before `now`, in seconds since 1970.
-  TrimmedFiles trim(const Bounds& bounds, std::int64_t now);
+  /// removes metadata that a killed process left without its log.
+  TrimmedFiles trim(const Bounds& bounds);
 
  private:
   KeptFiles(Kept kind, FileSystem& files, std::int64_t today)
       : kind_(kind), fileSystem_(files), today_(today) {}
 
-  Status listLogs();
+  Status listLogs(const LogFolder& folder);
   Status listRecords();
   Status listEvents();
   Status listSetAside(const std::string& folder);
   void add(const std::string& path, std::int64_t seconds);
   bool stays(std::size_t index) const;
   Status removeCompanions(const std::vector<std::string>& companions);
-  void removeOrphans(std::int64_t now);
 
   Kept kind_;
   FileSystem& fileSystem_;
   std::int64_t today_;
   std::string folder_;
-  std::vector<KeptFile> list_;  // in order of removal
-  std::vector<std::string> orphans_;
+  std::vector<KeptFile> list_;        // in order of removal
+  std::vector<std::string> orphans_;  // paths of metadata without its log
 };
 
 }  // namespace tavrel

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 
-#include "base/arithmetic.h"
 #include "platform/persisted_state.h"
 
 namespace tavrel {
@@ -43,7 +42,6 @@ void Tidy::trim(TidyReport& report) {
   // Without such a folder, there is nothing to remove.
   if (folder != std::end(kLockFolders)) lock = files_.lockFolder(root_.path(*folder), kPatience);
   if (!lock) return report.failures.push_back(lock.error().message);
-  const std::int64_t now = saturatingInt64(clock_.now().secondsSince1970());
   for (const KeptKind& kind : kKeptKinds) {
     TidiedKind& tidied = report.kinds.emplace_back();
     tidied.kind = &kind;
@@ -59,7 +57,7 @@ void Tidy::trim(TidyReport& report) {
       report.failures.push_back(files.error().message);
       continue;
     }
-    const TrimmedFiles trimmed = files->trim(tidied.bounds, now);
+    const TrimmedFiles trimmed = files->trim(tidied.bounds);
     tidied.removed = trimmed.removed;
     if (!trimmed.status) report.failures.push_back(trimmed.status.error().message);
   }

@@ -9,7 +9,6 @@
 #include <string_view>
 #include <vector>
 
-#include "platform/clock.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/limits/device_limits.h"
@@ -51,12 +50,11 @@ struct MeasuredKind {
 class Tidy {
  public:
   /// All must outlive it.
-  Tidy(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists, Clock& clock,
+  Tidy(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,
        Preferences& preferences, SqliteStore& store)
       : root_(root),
         files_(files),
         propertyLists_(propertyLists),
-        clock_(clock),
         preferences_(preferences),
         store_(store) {}
 
@@ -78,7 +76,6 @@ class Tidy {
   const DeviceRoot& root_;
   FileSystem& files_;
   PropertyListCoding& propertyLists_;
-  Clock& clock_;
   Preferences& preferences_;
   SqliteStore& store_;
 };

@@ -15,22 +15,12 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission";
-
 constexpr std::size_t kWithheldLogs = 8;
 
 // Logs are readable only by their owner and a group of operators; withheld logs only by their
 // owner.
 constexpr mode_t kMode = 0640;
 constexpr mode_t kWithheldMode = 0600;
-
-std::string join(const std::string& folder, std::string_view name, std::string_view ending) {
-  std::string path = folder;
-  path += '/';
-  path += name;
-  path += ending;
-  return path;
-}
 
 class SubmittedFile final : public LogFile {
  public:
@@ -49,7 +39,7 @@ class SubmittedFile final : public LogFile {
 
 FileSubmission::FileSubmission(const DeviceRoot& root, const Services& services,
                                bool changesNothing)
-    : folder_(root.path(kFolder)),
+    : folder_(root.path(kSubmissionFolder)),
       services_(services),
       files_(services.files),
       log_(services.log),
@@ -89,7 +79,7 @@ void FileSubmission::completeWithdrawal() {
     setSubmissionPermission(services_.preferences, {});
     services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
   }
-  const RemovedLogs removed = removeLogs({folder(Place::Pending), folder(Place::Outbox)}, true);
+  const RemovedLogs removed = removeLogs({kPendingFolder, kOutboxFolder}, true);
   if (removed.logs > 0) {
     log_.log(LogLevel::Default, "submission is not allowed: %zu waiting log%s deleted",
              removed.logs, removed.logs == 1 ? "" : "s");
@@ -154,11 +144,11 @@ Status FileSubmission::fileLog(std::string_view logType, std::string_view logNam
   if (!metadataBytes) return metadataBytes.error();
 
   if (place == Place::Withheld) {
-    if (Status made = files_.makePrivateFolder(folder(place)); !made) return made;
+    if (Status made = files_.makePrivateFolder(folder(place).path()); !made) return made;
   }
   const std::string name = newLogFileName(logName, now);
-  Expected<NewFile> file = files_.create(join(folder(place), name, kLogEnding),
-                                         place == Place::Withheld ? kWithheldMode : kMode);
+  Expected<NewFile> file =
+      files_.create(folder(place).logPath(name), place == Place::Withheld ? kWithheldMode : kMode);
   if (!file) return file.error();
   SubmittedFile handle(*file);
   writer(handle);
@@ -179,22 +169,24 @@ Status FileSubmission::commit(NewFile& file, const Destination& destination,
     if (!stored) return stored.error();
     if (!stored->covers(destination.day)) return Error{"submission is no longer allowed"};
   }
-  const std::string metadataPath = join(folder(place), name, kLogMetadataEnding);
-  Status done = files_.replace(metadataPath, asBytes(metadata), isWithheld ? kWithheldMode : kMode);
-  if (done) {
-    removeOldMetadata(place, metadataPath);
-    done = file.commit();
-  }
+  LogFolder logs = folder(place);
+  Status done = files_.replace(logs.metadataPath(name), asBytes(metadata),
+                               isWithheld ? kWithheldMode : kMode);
+  if (done) done = file.commit();
   if (!done) {
     // The log goes first: a visible log always has its metadata.
-    files_.discard(join(folder(place), name, kLogEnding));
-    files_.discard(metadataPath);
+    files_.discard(logs.logPath(name));
+    files_.discard(logs.metadataPath(name));
     return done;
+  }
+  if (const auto counts = countFiles(place); counts && counts->metadata > counts->logs) {
+    if (const auto listing = logs.list()) logs.removeOrphans(*listing);
   }
   if (isWithheld) {
     log_.log(LogLevel::Info, "log \"%s\" is withheld: submission is %s", name,
              textOf(submissionPermission(services_.preferences)));
-    keepNewestLogs(files_, folder(place), kWithheldLogs, name);
+    // A log that stays now goes with a later one.
+    static_cast<void>(logs.keepNewest(kWithheldLogs, UINT64_MAX, name, today()));
   }
   return Done{};
 }
@@ -206,10 +198,10 @@ Status FileSubmission::checkPermission() const {
   return Done{};
 }
 
-// Without `FileSystem::list`: building a sorted list takes several times as long as reading the
+// Without `LogFolder::list`: building a sorted list takes several times as long as reading the
 // folder.
 Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
-  const std::string path = folder(place);
+  const std::string path = folder(place).path();
   Files files;
   const int code = walkFolder(path, [&files](const dirent& entry) {
     const std::string_view name = entry.d_name;
@@ -222,52 +214,20 @@ Expected<FileSubmission::Files> FileSubmission::countFiles(Place place) const {
   return files;
 }
 
-// Removes metadata left by a process that was killed while filing a log. Ages are measured by the
-// file system's own clock, from the timestamp of a file made just now.
-void FileSubmission::removeOldMetadata(Place place, const std::string& freshMetadata) {
-  // Plus one, because the log being filed has only its metadata so far.
-  const auto counts = countFiles(place);
-  if (!counts || counts->metadata <= counts->logs + 1) return;
-  const auto fresh = FileSystem::status(freshMetadata);
-  const auto names = files_.list(folder(place));
-  if (!fresh || !names) return;
-  for (const std::string& file : *names) {
-    const std::string name = withoutEnding(file, kLogMetadataEnding);
-    const std::string log = std::string(name).append(kLogEnding);
-    if (name.empty() || std::ranges::binary_search(*names, log)) continue;
-    const std::string path = join(folder(place), file, {});
-    const auto found = FileSystem::status(path);
-    if (found && fresh->st_mtim.tv_sec - found->st_mtim.tv_sec > limits::kTemporaryFileSeconds) {
-      files_.discard(path);
-    }
-  }
-}
-
 void FileSubmission::submitDiagnosticLogs() {
   if (Status permitted = checkPermission(); !permitted) {
     log_.log(LogLevel::Info, "no log is moved to the outbox: %s", permitted.error().message);
     return;
   }
-  const auto files = files_.list(folder(Place::Pending));
-  if (!files) {
-    log_.write(LogLevel::Error, files.error().message);
+  const LogFolder pending = folder(Place::Pending);
+  const auto listing = pending.list();
+  if (!listing) {
+    log_.write(LogLevel::Error, listing.error().message);
     return;
   }
-  for (const std::string& file : *files) {
-    std::string name = withoutEnding(file, kLogEnding);
-    if (name.empty()) {
-      // Metadata moves after its log. Left over here, its log has already moved, before it in this
-      // list or before a process was killed.
-      name = withoutEnding(file, kLogMetadataEnding);
-      if (!name.empty() && !FileSystem::status(join(folder(Place::Pending), name, kLogEnding)) &&
-          FileSystem::status(join(folder(Place::Outbox), name, kLogEnding))) {
-        files_.discard(join(folder(Place::Pending), file, {}));
-      }
-      continue;
-    }
+  for (const std::string& name : listing->logs) {
     // A log that another process has sent on or deleted in the meantime needs no log line.
-    if (Status moved = moveToOutbox(name);
-        !moved && FileSystem::status(join(folder(Place::Pending), file, {}))) {
+    if (Status moved = moveToOutbox(name); !moved && FileSystem::status(pending.logPath(name))) {
       log_.log(LogLevel::Error, "cannot move log \"%s\" to the outbox: %s", name,
                moved.error().message);
     }
@@ -278,27 +238,16 @@ Status FileSubmission::moveToOutbox(const std::string& name) {
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return lock.error();
   if (Status permitted = checkPermission(); !permitted) return permitted;
-  const std::string outbox = folder(Place::Outbox);
-  const std::string metadataPath = join(folder(Place::Pending), name, kLogMetadataEnding);
-  const auto metadata = files_.readIfPresent(metadataPath, limits::kPropertyListBytes);
-  if (!metadata) return metadata.error();
-  const Status ready =
-      *metadata ? files_.replace(join(outbox, name, kLogMetadataEnding), asBytes(**metadata), kMode)
-                : files_.makeFolders(outbox);
-  if (!ready) return ready;
-  return files_.rename(join(folder(Place::Pending), name, kLogEnding),
-                       join(outbox, name, kLogEnding));
+  return folder(Place::Pending).moveLog(name, folder(Place::Outbox));
 }
 
 Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::files(Place place) {
-  const auto files = files_.list(folder(place));
-  if (!files) return files.error();
+  const LogFolder found = folder(place);
+  const auto listing = found.list();
+  if (!listing) return listing.error();
   std::vector<FiledLog> logs;
-  for (const std::string& file : *files) {
-    std::string name = withoutEnding(file, kLogEnding);
-    if (name.empty()) continue;
-    logs.push_back({place, std::move(name), join(folder(place), file, {}), {}});
-  }
+  for (const std::string& name : listing->logs)
+    logs.push_back({place, name, found.logPath(name), {}});
   return logs;
 }
 
@@ -309,8 +258,8 @@ Expected<std::size_t> FileSubmission::count(Place place) const {
 }
 
 void FileSubmission::readMetadata(FiledLog& log) {
-  const auto bytes = files_.readIfPresent(join(folder(log.place), log.name, kLogMetadataEnding),
-                                          limits::kPropertyListBytes);
+  const auto bytes =
+      files_.readIfPresent(folder(log.place).metadataPath(log.name), limits::kPropertyListBytes);
   if (!bytes || !*bytes) return;
   if (const auto value = services_.propertyLists.decode(asBytes(**bytes))) {
     log.metadata = value->dictionary();
@@ -342,17 +291,15 @@ std::size_t FileSubmission::countOfWaiting() const {
 }
 
 RemovedLogs FileSubmission::removeWaiting() {
-  return removeLogs({folder(Place::Pending), folder(Place::Outbox)}, false);
+  return removeLogs({kPendingFolder, kOutboxFolder}, false);
 }
 
 RemovedLogs FileSubmission::removeAll() {
-  return removeLogs({folder(Place::Pending), folder(Place::Outbox), folder(Place::Withheld),
-                     folder(Place::Refused)},
-                    false);
+  return removeLogs({kPendingFolder, kOutboxFolder, kWithheldFolder, kRefusedFolder}, false);
 }
 
 // Logs move from pending to the outbox; with the folders in this order none escapes.
-RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
+RemovedLogs FileSubmission::removeLogs(std::initializer_list<std::string_view> folders,
                                        bool onlyWithoutPermission) {
   if (!FileSystem::status(folder_)) return {};
   const auto lock = files_.lockFolder(folder_);
@@ -361,12 +308,13 @@ RemovedLogs FileSubmission::removeLogs(const std::vector<std::string>& folders,
     const auto stored = storedSubmissionPermission(services_.filePreferences);
     if (!stored || stored->isGiven) return {};
   }
-  return removeLogsIn(files_, folders);
+  return removeLogsIn(files_, folder_, folders);
 }
 
-std::string FileSubmission::folder(Place place) const {
-  constexpr const char* kNames[] = {"/pending", "/outbox", "/withheld", "/refused"};
-  return folder_ + kNames[static_cast<std::size_t>(place)];
+LogFolder FileSubmission::folder(Place place) const {
+  constexpr std::string_view kNames[] = {kPendingFolder, kOutboxFolder, kWithheldFolder,
+                                         kRefusedFolder};
+  return {folder_, kNames[static_cast<std::size_t>(place)], files_};
 }
 
 }  // namespace tavrel

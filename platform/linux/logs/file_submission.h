@@ -11,11 +11,10 @@
 // A process that files, moves or deletes waiting logs locks the folder Submission and then reads
 // the permission from storage: after a withdrawal nothing is filed or sent on.
 //
-// The metadata appears before the log and disappears after it, so each visible log has its
-// metadata. Metadata without a log is left by a killed process. It means nothing, and is removed
-// once it is older than `limits::kTemporaryFileSeconds`.
+// log_folder.h says what holds for all of these folders.
 #pragma once
 
+#include <initializer_list>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -117,7 +116,7 @@ class FileSubmission final : public SubmissionService {
     std::size_t metadata = 0;
   };
 
-  std::string folder(Place place) const;
+  LogFolder folder(Place place) const;
   std::int32_t today() const;
   Expected<Files> countFiles(Place place) const;
   Expected<Destination> destinationOfNewLog(std::string_view logType);
@@ -127,10 +126,10 @@ class FileSubmission final : public SubmissionService {
   Status commit(NewFile& file, const Destination& destination, const std::string& name,
                 const std::string& metadata);
   Status moveToOutbox(const std::string& name);
-  void removeOldMetadata(Place place, const std::string& freshMetadata);
   /// An error when storage does not have the owner's permission.
   Status checkPermission() const;
-  RemovedLogs removeLogs(const std::vector<std::string>& folders, bool onlyWithoutPermission);
+  RemovedLogs removeLogs(std::initializer_list<std::string_view> folders,
+                         bool onlyWithoutPermission);
   void completeWithdrawal();
 
   std::string folder_;
