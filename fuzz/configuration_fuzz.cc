@@ -20,7 +20,7 @@
 #include "reporting_values.h"
 #include "support.h"
 #include "upload/configuration.h"
-#include "upload/state.h"
+#include "upload/pause.h"
 
 using namespace tavrel;
 using fuzz::require;
@@ -121,13 +121,13 @@ void readMemory(Device& device) {
               (*again)->errors == (*run)->errors && (*again)->day == (*run)->day);
     }
   }
-  const std::string path = device.root.path(upload::kStatePath);
-  const auto state = upload::readState(device.files, device.coding, device.log, path);
+  const std::string path = device.root.path(kUploadStateFile);
+  const auto state = readUploadState(device.files, device.coding, device.log, path);
   require(state.sent >= 0 && state.refused >= 0 && state.failedAttempts >= 0);
   require(upload::pauseSeconds(state.failedAttempts, state.sent, 1.0) <=
           static_cast<double>(limits::kLongestUploadPauseSeconds));
-  if (!upload::writeState(device.files, device.coding, path, state)) return;
-  const auto again = upload::readState(device.files, device.coding, device.log, path);
+  if (!writeUploadState(device.files, device.coding, path, state)) return;
+  const auto again = readUploadState(device.files, device.coding, device.log, path);
   require(again.sent == state.sent && again.failure == state.failure);
 }
 
@@ -175,7 +175,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       break;
     case 4:
       device.write(kLastRunFile, content);
-      device.write(upload::kStatePath, content);
+      device.write(kUploadStateFile, content);
       readMemory(device);
       break;
     default:

@@ -23,6 +23,7 @@
 #include "platform/persisted_state.h"
 #include "upload/headers.h"
 #include "upload/network.h"
+#include "upload/pause.h"
 
 namespace tavrel::upload {
 namespace {
@@ -63,18 +64,19 @@ Uploader::Uploader(const Services& services, const Configuration& configuration)
     : services_(services),
       configuration_(configuration),
       outbox_(services.root, services.files),
-      statePath_(services.root.path(kStatePath)) {}
+      statePath_(services.root.path(kUploadStateFile)) {}
 
 void noteFailure(const Services& services, std::string_view why) {
   const auto lock = lockRun(services);
   if (!lock) services.log.write(LogLevel::Error, lock.error().message);
   if (!lock || !*lock) return;
-  const std::string path = services.root.path(kStatePath);
-  State state = readState(services.files, services.propertyLists, services.log, path);
+  const std::string path = services.root.path(kUploadStateFile);
+  UploadState state = readUploadState(services.files, services.propertyLists, services.log, path);
   state.failure = why;
   state.lastFailure = services.clock.now();
   ++state.failedAttempts;
-  if (Status written = writeState(services.files, services.propertyLists, path, state); !written) {
+  if (Status written = writeUploadState(services.files, services.propertyLists, path, state);
+      !written) {
     services.log.write(LogLevel::Error, written.error().message);
   }
 }
@@ -119,7 +121,8 @@ Outcome Uploader::run(bool atOnce) {
   }
   if (failed_ || !complaint_.empty()) ++state_.failedAttempts;
   if (tried_ || isOver || !complaint_.empty()) {
-    if (Status written = writeState(services_.files, services_.propertyLists, statePath_, state_);
+    if (Status written =
+            writeUploadState(services_.files, services_.propertyLists, statePath_, state_);
         !written) {
       services_.log.write(LogLevel::Error, written.error().message);
       outcome = Outcome::Failed;
@@ -129,7 +132,7 @@ Outcome Uploader::run(bool atOnce) {
 }
 
 Outcome Uploader::runLocked(bool atOnce) {
-  state_ = readState(services_.files, services_.propertyLists, services_.log, statePath_);
+  state_ = readUploadState(services_.files, services_.propertyLists, services_.log, statePath_);
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted_.isHeldBack()) {

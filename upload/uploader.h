@@ -16,6 +16,7 @@
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/logs/submission_permission.h"
+#include "platform/linux/runs/upload_state.h"
 #include "platform/preferences.h"
 #include "platform/property_list_coding.h"
 #include "platform/system_log.h"
@@ -23,7 +24,6 @@
 #include "upload/connection.h"
 #include "upload/outbox.h"
 #include "upload/packed_log.h"
-#include "upload/state.h"
 
 namespace tavrel::upload {
 
@@ -94,7 +94,7 @@ class Uploader {
   std::optional<Connection> connection_;  // made when there is something to send
   const std::string statePath_;
   const std::chrono::steady_clock::time_point begin_ = std::chrono::steady_clock::now();
-  State state_;
+  UploadState state_;
   SubmissionPermission permitted_;  // when last read
   std::size_t sent_ = 0;
   std::size_t refused_ = 0;

@@ -63,9 +63,7 @@ struct Device : DeviceServices {
     EXPECT_EQ(flock(lock.get(), LOCK_EX | LOCK_NB), 0);
     return lock;
   }
-  upload::State state() {
-    return upload::readState(files, coding, log, root.path(upload::kStatePath));
-  }
+  UploadState state() { return readUploadState(files, coding, log, root.path(kUploadStateFile)); }
   Outcome run(bool atOnce = false) { return run(atOnce, files); }
   Outcome run(bool atOnce, FileSystem& fileSystem) {
     return upload::Uploader({root, fileSystem, coding, preferences, clock, log}, configuration)

@@ -4,6 +4,7 @@
 #include "device.h"
 #include "upload/connection.h"
 #include "upload/network.h"
+#include "upload/pause.h"
 
 // Replaces the C library's function: the look-up of one name never ends.
 extern "C" int getaddrinfo(const char* node, const char* service, const addrinfo* hints,
@@ -115,7 +116,7 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   device.configuration.host = "127.evil.example";
   EXPECT_EQ(device.run(), Outcome::Waits);
   EXPECT_EQ(device.log.lines, Lines{"logs wait: there is no default route"});
-  EXPECT_FALSE(fs::exists(device.root.path(upload::kStatePath)));
+  EXPECT_FALSE(fs::exists(device.root.path(kUploadStateFile)));
   NoTables noTables;
   EXPECT_EQ(device.run(false, noTables), Outcome::Waits);
   EXPECT_EQ(device.state().failure,

@@ -69,7 +69,7 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
   }
   EXPECT_EQ(std::regex_replace(nginx.accessLog(), std::regex("\"time\":\"[^\"]*\",|\n"), ""),
             expected);
-  const upload::State state = device.state();
+  const UploadState state = device.state();
   EXPECT_EQ(std::tuple(state.sent, state.refused, state.failedAttempts, state.failure),
             std::tuple(6, 0, 0, ""));
   EXPECT_EQ(state.lastSuccess, plist::Date::since1970(1'795'802'538));
@@ -116,7 +116,7 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
     server.closesAfterAnswer = hasBody;
     EXPECT_EQ(device.runAgainst(server), Outcome::Waits);
     EXPECT_EQ(device.names().size(), 4U);
-    const upload::State state = device.state();
+    const UploadState state = device.state();
     EXPECT_EQ(state.failure, "cannot send log " + nameOf(1) + ": " + why);
     EXPECT_EQ(state.failedAttempts, 1);
     const double wait = state.nextAttempt.value_or(device.clock.time) - device.clock.time;

@@ -5,6 +5,8 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/log_file_name.h"
+#include "platform/linux/logs/log_folder.h"
+#include "platform/linux/runs/upload_state.h"
 #include "platform/plist/coding.h"
 #include "tools/check/checks.h"
 #include "tools/shared/table.h"
@@ -25,9 +27,6 @@ constexpr CheckFigureKind kSuccess{"success_timestamp_seconds",
                                    "tavrel_upload_success_timestamp_seconds", "seconds",
                                    "When a log was last sent."};
 
-constexpr std::string_view kFolder = "/var/mobile/Library/Logs/Submission/";
-constexpr std::string_view kStateFile = "/var/lib/tavrel/upload/state.plist";
-
 enum class Meaning : std::uint8_t {
   Moves,    // its logs should move on within days
   Rests,    // its logs may stay without anything being wrong
@@ -39,27 +38,24 @@ struct Queue {
   Meaning meaning;
 };
 
-constexpr Queue kQueues[] = {{"pending", Meaning::Moves},
-                             {"outbox", Meaning::Moves},
-                             {"withheld", Meaning::Rests},
-                             {"refused", Meaning::Refused}};
+constexpr Queue kQueues[] = {{kPendingFolder, Meaning::Moves},
+                             {kOutboxFolder, Meaning::Moves},
+                             {kWithheldFolder, Meaning::Rests},
+                             {kRefusedFolder, Meaning::Refused}};
 
 Check queueCheck(CheckScene& scene, const Queue& queue) {
   Check check{"queue", std::string(queue.name)};
-  const auto names = scene.context.linuxPlatform().fileSystem().list(
-      scene.context.root().path(std::string(kFolder).append(queue.name)));
-  if (!names) {
+  const auto listing = LogFolder(scene.context.root().path(kSubmissionFolder), queue.name,
+                                 scene.context.linuxPlatform().fileSystem())
+                           .list();
+  if (!listing) {
     check.state = CheckState::Unknown;
-    check.text = names.error().message;
+    check.text = listing.error().message;
     return check;
   }
-  constexpr std::string_view kEnding = ".log";
-  std::uint64_t logs = 0;
+  const std::size_t logs = listing->logs.size();
   std::optional<std::int64_t> oldest;
-  for (std::string_view name : *names) {
-    if (!name.ends_with(kEnding)) continue;
-    ++logs;
-    name.remove_suffix(kEnding.size());
+  for (const std::string& name : listing->logs) {
     const auto parsed = parseLogFileName(name);
     if (parsed) oldest = std::min(oldest.value_or(parsed->seconds), parsed->seconds);
   }
@@ -74,26 +70,21 @@ Check queueCheck(CheckScene& scene, const Queue& queue) {
   return check;
 }
 
-void addFigure(Check& check, const CheckFigureKind& kind, const plist::Dictionary& state,
-               std::string_view key) {
-  if (const auto number = state.number(key)) check.figures.push_back({&kind, number->real()});
-}
-
-void judgeUpload(CheckScene& scene, const plist::Dictionary& state, Check& check) {
-  const auto failed = state.number("FailedAttempts");
-  const auto success = state.date("LastSuccess");
-  addFigure(check, kFailed, state, "FailedAttempts");
-  addFigure(check, kSent, state, "Sent");
-  addFigure(check, kRefused, state, "Refused");
+void judgeUpload(CheckScene& scene, const UploadState& state, Check& check) {
+  const auto& success = state.lastSuccess;
+  check.figures = {{&kFailed, static_cast<double>(state.failedAttempts)},
+                   {&kSent, static_cast<double>(state.sent)},
+                   {&kRefused, static_cast<double>(state.refused)}};
   if (success) check.figures.push_back({&kSuccess, static_cast<double>(secondsOf(*success))});
   check.text =
       success ? format("a log was last sent %s ago", ageText(scene.ageOf(*success))) : "never sent";
-  if (!failed || failed->int64() <= 0) return;
+  if (state.failedAttempts == 0) return;
   // Without a single success, it has never worked.
   check.state = success ? stateOfAge(scene.ageOf(*success)) : CheckState::Warning;
-  check.text += format(
-      "; %s failed%s: %s", counted(static_cast<std::uint64_t>(failed->int64()), "attempt"),
-      success ? " since" : ", the last with", state.string("Failure").value_or("reason unknown"));
+  check.text += format("; %s failed%s: %s",
+                       counted(static_cast<std::uint64_t>(state.failedAttempts), "attempt"),
+                       success ? " since" : ", the last with",
+                       state.failure.empty() ? "reason unknown" : state.failure);
 }
 
 }  // namespace
@@ -105,7 +96,7 @@ void checkQueues(CheckScene& scene) {
 
 void checkUpload(CheckScene& scene) {
   Check check{"upload"};
-  const std::string path = scene.context.root().path(kStateFile);
+  const std::string path = scene.context.root().path(kUploadStateFile);
   const auto bytes =
       scene.context.linuxPlatform().fileSystem().readIfPresent(path, limits::kSystemFactBytes);
   if (!bytes) {
@@ -116,7 +107,7 @@ void checkUpload(CheckScene& scene) {
   } else {
     const auto state = plist::read(asBytes(**bytes));
     if (state && state->dictionary()) {
-      judgeUpload(scene, state->dictionary(), check);
+      judgeUpload(scene, uploadStateOf(state->dictionary()), check);
     } else {
       check.state = CheckState::Unknown;
       check.text = path + " is not a dictionary: the next attempt replaces it";

@@ -5,6 +5,7 @@
 #include <cstdint>
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "base/expected.h"
 #include "base/plist.h"
@@ -12,9 +13,9 @@
 #include "platform/property_list_coding.h"
 #include "platform/system_log.h"
 
-namespace tavrel::upload {
+namespace tavrel {
 
-struct State {
+struct UploadState {
   std::optional<plist::Date> lastAttempt;  // of a run that sent a log, or tried to
   std::optional<plist::Date> lastSuccess;
   std::optional<plist::Date> lastFailure;
@@ -28,21 +29,13 @@ struct State {
   bool hasFailure() const { return !failure.empty() || failedAttempts > 0 || nextAttempt; }
 };
 
-inline constexpr const char* kStatePath = "/var/lib/tavrel/upload/state.plist";
+inline constexpr std::string_view kUploadStateFile = "/var/lib/tavrel/upload/state.plist";
 
+UploadState uploadStateOf(const plist::Dictionary& stored);
 /// The stored state. When the file is unreadable, logs a line and returns an empty state.
-State readState(FileSystem& files, PropertyListCoding& propertyLists, SystemLog& log,
-                const std::string& path);
-Status writeState(FileSystem& files, PropertyListCoding& propertyLists, const std::string& path,
-                  const State& state);
+UploadState readUploadState(FileSystem& files, PropertyListCoding& propertyLists, SystemLog& log,
+                            const std::string& path);
+Status writeUploadState(FileSystem& files, PropertyListCoding& propertyLists,
+                        const std::string& path, const UploadState& state);
 
-/// Seconds until the next attempt after this many failed transfers in a row. `serverWish` is the
-/// delay that the server asked for in the last one (0: none). `chance`, from 0 to 1, spreads
-/// devices that failed at the same time.
-double pauseSeconds(std::int64_t failedTransfers, std::int64_t serverWish, double chance);
-
-/// Whether an attempt must wait. A time farther ahead than any pause was noted under
-/// another clock, and is ignored.
-bool mustWait(const State& state, plist::Date now);
-
-}  // namespace tavrel::upload
+}  // namespace tavrel
