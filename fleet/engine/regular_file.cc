@@ -3,9 +3,9 @@
 #include <cerrno>
 #include <fcntl.h>
 #include <sys/stat.h>
-#include <system_error>
 #include <unistd.h>
 
+#include "base/system_text.h"
 #include "fleet/engine/engine.h"
 #include "platform/linux/files/descriptor.h"
 
@@ -13,7 +13,7 @@ namespace tavrel::fleet {
 namespace {
 
 [[noreturn]] void fail(const std::string& path, const std::string& advice) {
-  throw EngineError(path + ": " + std::generic_category().message(errno) + ": " + advice);
+  throw EngineError(path + ": " + systemText(errno) + ": " + advice);
 }
 
 }  // namespace

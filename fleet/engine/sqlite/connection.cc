@@ -2,8 +2,8 @@
 
 #include <cmath>
 #include <sqlite3.h>
-#include <system_error>
 
+#include "base/system_text.h"
 #include "fleet/engine/engine.h"
 #include "fleet/engine/sqlite/real.h"
 
@@ -68,7 +68,7 @@ void Connection::fail(int code) const {
   std::string text = path_ + ": " + (handle_ ? sqlite3_errmsg(handle()) : sqlite3_errstr(code));
   if (const int system = handle_ ? sqlite3_system_errno(handle()) : 0;
       system != 0 && ((code & 0xFF) == SQLITE_IOERR || (code & 0xFF) == SQLITE_CANTOPEN))
-    text += " (" + std::generic_category().message(system) + ")";
+    text += " (" + systemText(system) + ")";
   throw EngineError(text + ": " + adviceFor(code, writes_));
 }
 
