@@ -11,6 +11,7 @@
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/folding/fold_notes.h"
 #include "platform/linux/folding/recorded_history.h"
+#include "platform/linux/folding/recorders.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
@@ -190,7 +191,7 @@ void checkRecording(CheckScene& scene) {
   checkCounters(scene, recorders, folder);
   if (!folder) {
     // Only root may look into the folder.
-    const bool isUnseen = access(root.path("/run/tavrel/stat").c_str(), R_OK) != 0;
+    const bool isUnseen = access(root.path(kSegmentFolder).c_str(), R_OK) != 0;
     const auto state = isUnseen ? CheckState::Unknown : CheckState::Critical;
     scene.checks.push_back({"folding", "", state, folder.error().message});
   } else if (!*folder) {
@@ -199,7 +200,7 @@ void checkRecording(CheckScene& scene) {
     scene.checks.push_back(foldingCheck(scene, recorders, **folder));
   }
   if (!fault.text.empty()) {
-    const bool isUnseen = isClosed(root.path("/etc/tavrel/recorders.plist"));
+    const bool isUnseen = isClosed(root.path(kRecordersFile));
     addFinding(scene.checks.back(), isUnseen ? CheckState::Unknown : CheckState::Warning,
                fault.text);
   }

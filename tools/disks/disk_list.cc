@@ -3,6 +3,7 @@
 #include <algorithm>
 
 #include "base/arithmetic.h"
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/health/drives.h"
 #include "platform/linux/health/reader.h"
 #include "platform/linux/linux_platform.h"

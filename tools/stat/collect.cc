@@ -14,7 +14,9 @@
 
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/folding/segment_folder.h"
 #include "platform/system_log.h"
 #include "tools/shared/table.h"
 #include "tools/stat/collect_sources.h"
@@ -228,7 +230,7 @@ class SingleReadings {
   SingleReadings(ToolContext& context, ValueRecorder& recorder, const std::string& stateFile)
       : context_(context),
         path_(stateFile.empty() ? context.root().path("/run/tavrel/collect.state") : stateFile),
-        boot_(bootIdentity(context.root())),
+        boot_(bootIDOf(context.root())),
         collector_(context, recorder, 1) {}
 
   void take(std::chrono::nanoseconds now) {
@@ -304,7 +306,7 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
                   CollectPace& pace) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
-  const std::string folder = context.root().path(kStatFolder);
+  const std::string folder = context.root().path(kSegmentFolder);
   const auto hasFolder = [&] { return FileSystem::status(folder).has_value(); };
   const bool isInStore = !(*recorder)->isInMemory();
   const bool lacksFolder = isInStore && !hasFolder();

@@ -102,13 +102,6 @@ void appendPair(std::string& text, const char* name, const std::optional<Pair>& 
 
 }  // namespace
 
-std::string bootIdentity(const DeviceRoot& root) {
-  FileSystem files;
-  auto text = files.read(root.pathOrMachine("/proc/sys/kernel/random/boot_id"), 64);
-  if (!text) return {};
-  return text->substr(0, text->find_first_of(" \n"));
-}
-
 Expected<std::optional<CollectState>> readCollectState(const std::string& path,
                                                        const std::string& boot,
                                                        std::chrono::nanoseconds now) {

@@ -22,9 +22,6 @@ struct CollectState {
   std::map<std::string, double> remainders;
 };
 
-/// The kernel's identifier for this boot of the machine; empty when unknown.
-std::string bootIdentity(const DeviceRoot& root);
-
 /// Nothing when there is no file, or when its reading is from another boot, from the future or
 /// older than a day. An error when `writeCollectState` did not write the file.
 Expected<std::optional<CollectState>> readCollectState(const std::string& path,

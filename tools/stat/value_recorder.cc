@@ -14,6 +14,7 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/folding/recorders.h"
+#include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
@@ -114,8 +115,7 @@ class StoreRecorder final : public ValueRecorder {
 
 // The device's recorders, read only when they matter: root may record every key.
 Recorders recordersOf(ToolContext& context) {
-  const bool isNeeded =
-      geteuid() != 0 && FileSystem::status(context.root().path("/etc/tavrel/recorders.plist"));
+  const bool isNeeded = geteuid() != 0 && FileSystem::status(context.root().path(kRecordersFile));
   if (!isNeeded) return {};
   FileSystem files;
   Platform& platform = context.platform();
@@ -126,7 +126,7 @@ Recorders recordersOf(ToolContext& context) {
 
 Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
   const std::string root = context.root().path("");
-  const std::string folder = context.root().path(kStatFolder);
+  const std::string folder = context.root().path(kSegmentFolder);
   setenv("TAVREL_ROOT", root.c_str(), 1);
   // The library starts with the first lookup of a key. A key without values leaves no trace.
   BHClientScalarForKey("any");

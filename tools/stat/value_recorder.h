@@ -17,8 +17,6 @@
 
 namespace tavrel {
 
-inline constexpr std::string_view kStatFolder = "/run/tavrel/stat";
-
 /// When a value was measured. Recording in memory ignores this and reads the same clock itself.
 struct ValueTime {
   std::int32_t day;

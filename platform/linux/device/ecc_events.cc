@@ -11,15 +11,14 @@
 #include "base/limits.h"
 #include "base/parse_number.h"
 #include "base/uuid.h"
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/files/property_list_file.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kFolder = "/var/lib/tavrel/ecc-events";
 constexpr std::string_view kCounters = "/var/lib/tavrel/edac-counters.plist";
 constexpr std::string_view kControllers = "/sys/devices/system/edac/mc";
-constexpr std::string_view kBootIDFile = "/proc/sys/kernel/random/boot_id";
 constexpr std::string_view kEventEnding = ".event";
 constexpr std::string_view kErrorEnding = ".errno";
 constexpr mode_t kMode = 0640;
@@ -85,7 +84,7 @@ SystemControls::Result EccEvents::next(MutableByteSpan buffer) {
       ++handedOut_;
       return give(event.bytes, buffer);
     }
-    const std::string path = root_.path(kFolder) + '/' + event.name;
+    const std::string path = root_.path(kEccEventFolder) + '/' + event.name;
     const auto content = files_.readIfPresent(path, limits::kSystemFactBytes);
     if (content && !*content) continue;  // another process took it
     const bool isEvent = path.ends_with(kEventEnding);
@@ -135,7 +134,7 @@ void EccEvents::setAside(const std::string& path, std::string_view fault) {
 
 bool EccEvents::lockQueue() {
   if (folderLock_) return true;
-  auto lock = files_.lockFolder(root_.path(kFolder));
+  auto lock = files_.lockFolder(root_.path(kEccEventFolder));
   if (!lock) {
     log_.write(LogLevel::Error, lock.error().message);
     return false;
@@ -153,7 +152,7 @@ bool EccEvents::fill() {
   } else if (!publishCountedErrors()) {
     return false;
   }
-  const auto names = files_.list(root_.path(kFolder));
+  const auto names = files_.list(root_.path(kEccEventFolder));
   if (!names) {
     log_.write(LogLevel::Error, names.error().message);
     return true;
@@ -181,7 +180,7 @@ bool EccEvents::publishCountedErrors() {
   if (before == plist::Value(counted)) return true;
   if (!folderLock_) {
     // Another process may publish the same errors until the folder is locked.
-    if (Status made = files_.makeFolders(root_.path(kFolder)); !made) {
+    if (Status made = files_.makeFolders(root_.path(kEccEventFolder)); !made) {
       log_.write(LogLevel::Error, made.error().message);
       return true;
     }
@@ -194,14 +193,14 @@ bool EccEvents::publishCountedErrors() {
   // place although they could not be flushed.
   if (before != plist::Value(seenErrors())) return true;
   for (const Event& event : events)
-    files_.discard(root_.path(kFolder) + '/' + event.name);
+    files_.discard(root_.path(kEccEventFolder) + '/' + event.name);
   return true;
 }
 
 // Events first: a run that is cut off in between publishes them twice instead of never.
 Status EccEvents::publish(const std::vector<Event>& events, const plist::Dictionary& counted) {
   for (const Event& event : events) {
-    const std::string path = root_.path(kFolder) + '/' + event.name;
+    const std::string path = root_.path(kEccEventFolder) + '/' + event.name;
     if (Status written = files_.replace(path, asBytes(event.bytes), kMode); !written) {
       return written;
     }

@@ -35,6 +35,8 @@
 
 namespace tavrel {
 
+inline constexpr std::string_view kEccEventFolder = "/var/lib/tavrel/ecc-events";
+
 inline constexpr std::size_t kEccEventBytes = 72;
 
 /// The most events that one run of reads hands out.

@@ -17,7 +17,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kRecordersPath = "/etc/tavrel/recorders.plist";
 constexpr std::string_view kSystemPrefix = "com.norvane.";
 
 std::optional<std::uint32_t> userNumber(std::string_view user) {
@@ -42,7 +41,7 @@ std::optional<std::uint32_t> userNumber(std::string_view user) {
 Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
                           PropertyListCoding& propertyLists, SystemLog& log) {
   Recorders recorders;
-  const std::string path = root.path(kRecordersPath);
+  const std::string path = root.path(kRecordersFile);
   const auto status = FileSystem::status(path);
   if (!status) {
     struct stat link {};

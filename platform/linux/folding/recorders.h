@@ -25,12 +25,14 @@
 
 namespace tavrel {
 
+inline constexpr std::string_view kRecordersFile = "/etc/tavrel/recorders.plist";
+
 class Recorders {
  public:
   /// With no user listed.
   Recorders() = default;
 
-  /// Reads /etc/tavrel/recorders.plist. A file that is damaged, that users other than root and this
+  /// Reads `kRecordersFile`. A file that is damaged, that users other than root and this
   /// user could have written, or that is a dangling link counts as absent, with a line in the log;
   /// so does each entry that is not understood.
   static Recorders read(const DeviceRoot& root, FileSystem& files,

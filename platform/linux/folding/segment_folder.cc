@@ -19,7 +19,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kFolderPath = "/run/tavrel/stat";
 constexpr const char* kRequest = "fold-wanted";
 constexpr std::string_view kSegmentEnding = ".segment";
 
@@ -68,7 +67,7 @@ class Sample {
 }  // namespace
 
 Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& root) {
-  std::string path = root.path(kFolderPath);
+  std::string path = root.path(kSegmentFolder);
   Descriptor folder(::open(path.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
   if (!folder) {
     if (errno == ENOENT) return std::optional<SegmentFolder>();
@@ -85,7 +84,7 @@ Expected<std::optional<SegmentFolder>> SegmentFolder::open(const DeviceRoot& roo
 }
 
 bool SegmentFolder::isOutOfReach(const DeviceRoot& root) {
-  const std::string path = root.path(kFolderPath);
+  const std::string path = root.path(kSegmentFolder);
   struct statfs fileSystem {};
   if (access(path.c_str(), R_OK) != 0) return errno == EACCES;
   return statfs(path.c_str(), &fileSystem) == 0 && fileSystem.f_type != TMPFS_MAGIC;

@@ -19,6 +19,8 @@
 
 namespace tavrel {
 
+inline constexpr std::string_view kSegmentFolder = "/run/tavrel/stat";
+
 /// A file in the folder that looks like a segment, not opened yet.
 struct SegmentEntry {
   std::string name;

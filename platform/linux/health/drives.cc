@@ -158,8 +158,4 @@ Expected<std::vector<Drive>> findDrives(const Machine& machine) {
   return drives;
 }
 
-std::string bootIDOf(const DeviceRoot& root) {
-  return readLabel(root.pathOrMachine("/proc/sys/kernel/random/boot_id"));
-}
-
 }  // namespace tavrel::health

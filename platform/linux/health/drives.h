@@ -34,7 +34,4 @@ struct Drive {
 /// By kind and number. An error when a folder of sysfs cannot be listed.
 Expected<std::vector<Drive>> findDrives(const Machine& machine);
 
-/// The ID of this boot; empty when it cannot be read.
-std::string bootIDOf(const DeviceRoot& root);
-
 }  // namespace tavrel::health

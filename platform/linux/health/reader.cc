@@ -7,6 +7,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "base/text.h"
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/health/ata_smart.h"
 #include "platform/linux/health/flash_life.h"

@@ -6,14 +6,15 @@
 
 #include "base/civil_time.h"
 #include "base/limits.h"
+#include "platform/linux/device/ecc_events.h"
 #include "platform/linux/logs/record_file_name.h"
+#include "platform/linux/preferences/file_preferences.h"
 
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kEventFolder = "/var/lib/tavrel/ecc-events";
-constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold",
-                                                 "/var/mobile/Library/Preferences", kEventFolder};
+constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold", kPreferencesFolder,
+                                                 kEccEventFolder};
 constexpr std::int64_t kBlockBytes = 4096;
 
 std::string_view folderOf(Kept kind) {
@@ -51,7 +52,8 @@ std::int64_t KeptFile::day() const {
 
 Expected<Descriptor> KeptFiles::lock(Kept kind, const DeviceRoot& root, FileSystem& files) {
   if (kind == Kept::Records || kind == Kept::SetAside) return Descriptor();
-  const std::string folder = root.path(kind == Kept::EccEvents ? kEventFolder : kSubmissionFolder);
+  const std::string folder =
+      root.path(kind == Kept::EccEvents ? kEccEventFolder : kSubmissionFolder);
   return FileSystem::status(folder) ? files.lockFolder(folder) : Descriptor();
 }
 
@@ -65,7 +67,7 @@ Expected<KeptFiles> KeptFiles::list(Kept kind, const DeviceRoot& root, FileSyste
       listed = kept.listRecords();
       break;
     case Kept::EccEvents:
-      kept.folder_ = root.path(kEventFolder);
+      kept.folder_ = root.path(kEccEventFolder);
       listed = kept.listEvents();
       break;
     case Kept::SetAside:

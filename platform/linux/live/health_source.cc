@@ -10,6 +10,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/health/drives.h"
 #include "platform/linux/health/reading.h"
@@ -53,7 +54,7 @@ static_assert(std::ranges::is_sorted(kDailyFigures));
 std::vector<health::NamedFigure> figuresNow(const DeviceRoot& root) {
   FileSystem files;
   std::vector<health::Reading> readings = health::loadReadings(root, files).readings;
-  const std::string boot = health::bootIDOf(root);
+  const std::string boot = bootIDOf(root);
   const std::int64_t now = std::time(nullptr);
   std::erase_if(readings, [&](const health::Reading& reading) {
     constexpr auto kUnusable = health::kUnread | health::kOld;

@@ -12,7 +12,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::string_view kFolder = "/var/mobile/Library/Preferences";
 constexpr std::string_view kEnding = ".plist";
 constexpr mode_t kMode = 0640;
 
@@ -28,7 +27,7 @@ std::string quoted(std::string_view text) {
 
 FilePreferences::FilePreferences(const DeviceRoot& root, FileSystem& files,
                                  PropertyListCoding& propertyLists, Clock& clock, SystemLog& log)
-    : folder_(root.path(kFolder)),
+    : folder_(root.path(kPreferencesFolder)),
       files_(files),
       propertyLists_(propertyLists),
       clock_(clock),

@@ -32,6 +32,8 @@
 
 namespace tavrel {
 
+inline constexpr std::string_view kPreferencesFolder = "/var/mobile/Library/Preferences";
+
 class FilePreferences final : public Preferences {
  public:
   FilePreferences(const DeviceRoot& root, FileSystem& files, PropertyListCoding& propertyLists,

@@ -4,6 +4,7 @@
 #include <unistd.h>
 
 #include "base/limits.h"
+#include "platform/linux/files/boot_id.h"
 #include "platform/linux/files/process_stat.h"
 #include "platform/plist/coding.h"
 
@@ -19,8 +20,9 @@ std::string kernelText(const std::string& path) {
   return std::move(*text);
 }
 
+// Processes are the machine's, whatever the root.
 std::string bootOfMachine() {
-  return kernelText("/proc/sys/kernel/random/boot_id");
+  return bootIDOf(DeviceRoot("/"));
 }
 
 // The process's start in clock ticks since boot; 0 when there is no such process.
