@@ -219,24 +219,27 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
                     percentEncoded(outbox_.logPath(log.name))));
     return Step::Next;
   }
-  const auto ready = prepare(log);
-  if (!ready) {
-    complain(ready.error().message);
+  // Read the log only once, so that the permission is checked for exactly what is sent.
+  auto read = readLog(outbox_.logPath(log.name));
+  if (!read) {
+    complain(read.error().message);
     return Step::Next;
   }
-  if (!*ready) return Step::Next;
-  const PackedLog& packed = (*ready)->packed;
-  const std::int64_t day = (*ready)->day;
+  if (!*read) return Step::Next;
+  const std::int64_t day = dayToCover(log, (*read)->content);
+  if (const Step asked = askPermission(day); asked != Step::Next) return asked;
+  if (timeLeft() <= std::chrono::milliseconds(0)) return stopAtLimit();
+  const PackedLog packed = packer_.pack(asBytes((*read)->content), (*read)->stamp);
+  read->reset();  // it may be large
   std::vector<std::string> headers = metadataHeaders(metadataOf(log));
   headers.push_back(std::string(kDigestHeader) + ": " + packed.digest);
 
+  // Packing a large log may have taken seconds.
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
-  const std::chrono::milliseconds left = timeLeft();
-  if (left <= std::chrono::milliseconds(0)) return stopAtLimit();
   tried_ = true;
   const auto answer = connection_->put(
       format("%s/%s%s", configuration_.url, log.name, kLogEnding), headers, packed.content,
-      std::min<std::chrono::milliseconds>(configuration_.transfer, left),
+      std::min<std::chrono::milliseconds>(configuration_.transfer, timeLeft()),
       [&] { return askPermission(day) == Step::Next; });
   if (answer) return judge(log, *answer, packed);
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
@@ -265,16 +268,10 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
   return value ? value->dictionary() : plist::Dictionary();
 }
 
-Expected<std::optional<Uploader::ReadyLog>> Uploader::prepare(const WaitingLog& log) {
-  // Read the log only once, so that the permission is checked for exactly what is sent.
-  const auto read = readLog(outbox_.logPath(log.name));
-  if (!read) return read.error();
-  if (!*read) return std::optional<ReadyLog>();
-  const auto& [content, stamp] = **read;
+// Like the submission service, judges a log without statistics by the day on which it was made.
+std::int64_t Uploader::dayToCover(const WaitingLog& log, std::string_view content) {
   const std::optional<std::int64_t> day = dayOfLog(content, services_.propertyLists);
-  // Like the submission service, judge a log without statistics by the day on which it was made.
-  const std::int64_t filed = daysFromCivil(civilFromSeconds(log.filed).date);
-  return std::optional(ReadyLog{packer_.pack(asBytes(content), stamp), day.value_or(filed)});
+  return day.value_or(daysFromCivil(civilFromSeconds(log.filed).date));
 }
 
 Uploader::Step Uploader::askPermission(std::int64_t day) {

@@ -57,10 +57,6 @@ class Uploader {
 
  private:
   enum class Permission { Given, Withdrawn, NotGiven };
-  struct ReadyLog {
-    PackedLog packed;
-    std::int64_t day;  // which the permission must cover
-  };
   enum class Step { Next, Held, Stop, Broken, Withdrawn, Misconfigured };
 
   /// Rereads `permitted_`. `NotGiven` also when its first day is not a valid day.
@@ -69,8 +65,8 @@ class Uploader {
   Outcome sendAll(std::vector<WaitingLog> logs);
   Step send(const WaitingLog& log);
   plist::Dictionary metadataOf(const WaitingLog& log);
-  /// Nothing when the log is gone.
-  Expected<std::optional<ReadyLog>> prepare(const WaitingLog& log);
+  /// The day that the permission must cover.
+  std::int64_t dayToCover(const WaitingLog& log, std::string_view content);
   /// Whether a log of `day` may be sent now; `Next` when it may.
   Step askPermission(std::int64_t day);
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
