@@ -11,6 +11,7 @@
 #include "base/limits.h"
 #include "base/text.h"
 #include "platform/linux/folding/fold_notes.h"
+#include "platform/linux/folding/position_budget.h"
 #include "platform/linux/folding/recorders.h"
 #include "platform/linux/folding/scalar_changes.h"
 #include "platform/linux/folding/segment_folder.h"
@@ -34,13 +35,6 @@ constexpr std::string_view kLargePositions =
     "what must be remembered of segments that are in use exceeds 1 MiB; record fewer keys, or from "
     "fewer programs at a time";
 static_assert(limits::kPositionBytesPerUser == 1U << 20);
-
-struct LessName {
-  bool operator()(const SegmentName& a, const SegmentName& b) const {
-    return std::pair(a.owner, a.identity) < std::pair(b.owner, b.identity);
-  }
-};
-using SegmentNames = std::set<SegmentName, LessName>;
 
 // A segment whose values the store takes, and what to do with it after the commit.
 struct FoldedSegment {
@@ -71,13 +65,19 @@ class FoldRun {
   Status take(SqliteBatch& batch, const SegmentEntry& entry);
   Status takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
                     const SegmentName& name, bool isWriterGone);
+  /// The position as stored, and decoded. Nothing when no fold of this version can go on from it.
+  struct Stored {
+    std::string bytes;
+    SegmentPosition position;
+  };
+  Expected<std::optional<Stored>> storedPosition(SqliteBatch& batch, const SegmentName& name);
+  void count(const SegmentName& name, const SegmentIntake& intake, const SegmentProgress& progress);
   Status dropPositions(SqliteBatch& batch);
-  bool mustWait(const SegmentName& name);
+  /// Whether the values of a segment may be taken now. If not, notes why.
+  bool admit(const SegmentName& name);
   /// Says that segments of a user exceed a limit. `limit` says which, and what to do.
   void tellOfLimit(std::uint32_t owner, std::string_view limit);
   bool isStoreFull() const;
-  Expected<bool> hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner, std::size_t before,
-                                    std::size_t most);
   void finishSegments();
 
   const SegmentFolder& folder_;
@@ -89,9 +89,7 @@ class FoldRun {
   const BootInstant boot_ = currentBootInstant();
 
   FoldedRows rows_;
-  std::optional<SegmentNames> known_;               // segments with positions in the store
-  std::map<std::uint32_t, std::size_t> positions_;  // of each user
-  std::map<std::uint32_t, std::int64_t> positionBytes_;
+  PositionBudget positions_;
   SegmentNames found_;
   std::set<std::uint32_t> unseen_;    // users with segments of unknown identity
   std::vector<SegmentName> removed_;  // their positions would keep new segments waiting
@@ -140,20 +138,13 @@ void FoldRun::tellOfLimit(std::uint32_t owner, std::string_view limit) {
 }
 
 Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing) {
-  if (!known_) {
-    const auto names = batch.segmentNames();
-    if (!names) return names.error();
-    known_.emplace(names->begin(), names->end());
-    for (const SegmentName& name : *known_)
-      ++positions_[name.owner];
-  }
+  if (Status done = positions_.load(batch); !done) return done;
   const auto bytes = batch.bytesInUse();
   if (!bytes) return bytes.error();
   bytesBefore_ = *bytes;
   rowsBefore_ = rows_.size();
   for (const SegmentName& name : std::exchange(removed_, {})) {
-    if (Status done = batch.removeSegmentPosition(name.owner, name.identity); !done) return done;
-    --positions_[name.owner];
+    if (Status done = positions_.removeEnd(batch, name); !done) return done;
   }
   while (next_ < listing.segments.size() && folded_.size() < limits::kFoldSegmentsAtOnce &&
          counts_.values < limits::kFoldValuesAtOnce && changes_.bytes() < limits::kFoldKeyBytes) {
@@ -209,7 +200,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
     notes_.refuse(folder_.refusal(entry.name, "a copy of another segment"));
     return Done{};
   }
-  if (mustWait(name)) {
+  if (!admit(name)) {
     ++report_.waiting;
     return Done{};
   }
@@ -222,59 +213,39 @@ bool FoldRun::isStoreFull() const {
          storeBytes_;
 }
 
-bool FoldRun::mustWait(const SegmentName& name) {
+bool FoldRun::admit(const SegmentName& name) {
   if (name.owner != 0 && isStoreFull()) {
     notes_.tell(
         "the statistics store is far beyond its limit: what users other than root record waits "
         "until days are reported and removed; see 'tavrelctl limits'");
-    return true;
+    return false;
   }
   if (values_[name.owner] >= limits::kFoldValuesPerUser) {
     tellOfLimit(name.owner, kManyValues);
-    return true;
+    return false;
   }
   if (report_.values + counts_.values >= limits::kFoldValues) {
     notes_.tell(
         "segments wait: the fold has taken as many measurements of all users as it may; fold more "
         "often");
-    return true;
+    return false;
   }
-  if (known_->contains(name) || ++positions_[name.owner] <= limits::kSegmentsPerUser) return false;
+  if (positions_.admit(name)) return true;
   tellOfLimit(name.owner, kManySegments);
-  return true;
-}
-
-// Whether the position of a segment may grow from `before` to `most` bytes.
-Expected<bool> FoldRun::hasRoomForPosition(SqliteBatch& batch, std::uint32_t owner,
-                                           std::size_t before, std::size_t most) {
-  if (most <= before) return true;
-  auto known = positionBytes_.find(owner);
-  if (known == positionBytes_.end()) {
-    const auto bytes = batch.segmentPositionBytes(owner);
-    if (!bytes) return bytes.error();
-    known = positionBytes_.emplace(owner, *bytes).first;
-  }
-  return known->second + static_cast<std::int64_t>(most - before) <=
-         std::int64_t{limits::kPositionBytesPerUser};
+  return false;
 }
 
 Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
                            const SegmentName& name, bool isWriterGone) {
-  SegmentPosition position;
-  std::string before;
-  if (known_->contains(name)) {
-    auto stored = batch.segmentPosition(name.owner, name.identity);
-    if (!stored) return stored.error();
-    if (*stored) before = **stored;
-    if (auto decoded = SegmentPosition::decode(before)) {
-      position = *std::move(decoded);
-    } else if (!before.empty()) {
-      notes_.tell("a segment of user " + std::to_string(name.owner) +
-                  " waits: another version of this program began to fold it; restart the device");
-      ++report_.waiting;
-      return Done{};
-    }
+  auto stored = storedPosition(batch, name);
+  if (!stored) return stored.error();
+  if (!*stored) {
+    notes_.tell("a segment of user " + std::to_string(name.owner) +
+                " waits: another version of this program began to fold it; restart the device");
+    ++report_.waiting;
+    return Done{};
   }
+  auto& [before, position] = **stored;
   if (position.isEnd) {
     if (isWriterGone) {
       folded_.push_back({name, std::move(segment), {}, true});
@@ -286,7 +257,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   // A segment without a writer leaves only a mark, unless values wait for a date.
   if (!isWriterGone || !boot_) {
     const auto hasRoom =
-        hasRoomForPosition(batch, name.owner, before.size(), reader.positionBytes());
+        positions_.hasRoom(batch, name.owner, before.size(), reader.positionBytes());
     if (!hasRoom) return hasRoom.error();
     if (!*hasRoom) {
       tellOfLimit(name.owner, kLargePositions);
@@ -300,14 +271,32 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   if (Status done = batch.limitWaiting(); !done) return done;
   const bool isOver = isWriterGone && progress.isComplete;
   if (isOver) position = SegmentPosition::end();
-  if (const std::string after = position.encode(); after != before) {
-    if (Status done = batch.setSegmentPosition(name.owner, name.identity, after); !done) {
-      return done;
-    }
-    if (const auto bytes = positionBytes_.find(name.owner); bytes != positionBytes_.end()) {
-      bytes->second += std::ssize(after) - std::ssize(before);
-    }
+  if (Status done = positions_.store(batch, name, before, position.encode()); !done) return done;
+  count(name, intake, progress);
+  // The acknowledgement tells a program that dropped values that there may be room again.
+  if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
+    folded_.push_back({name, std::move(segment), std::move(progress), isOver});
   }
+  return Done{};
+}
+
+Expected<std::optional<FoldRun::Stored>> FoldRun::storedPosition(SqliteBatch& batch,
+                                                                 const SegmentName& name) {
+  Stored stored;
+  if (!positions_.known().contains(name)) return std::optional(std::move(stored));
+  auto bytes = batch.segmentPosition(name.owner, name.identity);
+  if (!bytes) return bytes.error();
+  stored.bytes = bytes->value_or("");
+  if (auto decoded = SegmentPosition::decode(stored.bytes)) {
+    stored.position = *std::move(decoded);
+  } else if (!stored.bytes.empty()) {
+    return std::optional<Stored>();
+  }
+  return std::optional(std::move(stored));
+}
+
+void FoldRun::count(const SegmentName& name, const SegmentIntake& intake,
+                    const SegmentProgress& progress) {
   if (!intake.foreignKey().empty() && toldUsers_.insert(name.owner).second) {
     std::string key;
     appendQuoted(key, std::string_view(intake.foreignKey()).substr(0, 80));
@@ -322,16 +311,11 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   values_[name.owner] += intake.values();
   counts_.refused += intake.refused() + progress.refused;
   counts_.dropped += std::min(progress.dropped, limits::kLargestDrop);
-  // The acknowledgement tells a program that dropped values that there may be room again.
-  if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
-    folded_.push_back({name, std::move(segment), std::move(progress), isOver});
-  }
-  return Done{};
 }
 
 // Removes the positions of segments that an earlier fold removed or that a restart has erased.
 Status FoldRun::dropPositions(SqliteBatch& batch) {
-  for (const SegmentName& name : *known_) {
+  for (const SegmentName& name : positions_.known()) {
     if (found_.contains(name) || unseen_.contains(name.owner)) continue;
     if (Status done = batch.removeSegmentPosition(name.owner, name.identity); !done) return done;
   }
@@ -344,7 +328,8 @@ void FoldRun::finishSegments() {
     if (folded.isOver) {
       if (!folder_.remove(folded.segment)) continue;
       ++counts_.removed;
-      if (positions_[folded.name.owner] > limits::kSegmentsPerUser / 2) {
+      // An empty segment has no position.
+      if (folded.name != SegmentName() && positions_.isHalfUsed(folded.name.owner)) {
         removed_.push_back(folded.name);
       }
       continue;
