@@ -2,11 +2,15 @@
 
 #include <algorithm>
 #include <numeric>
+#include <optional>
 #include <tuple>
 
 namespace tavrel::fleet {
 
 namespace {
+
+/// All choices of so many components are tried. Of more, some are joined first.
+constexpr std::size_t kMostComponents = 12;
 
 /// Disjoint sets of groups.
 class Components {
@@ -32,7 +36,10 @@ class Components {
 
 Crossing::Crossing(const LogTable& table, const std::vector<const LogSet*>& groups,
                    const Sets& earlier, std::size_t devicesAtLeast)
-    : groups_(groups.size()), earlier_(earlier.size()), devicesAtLeast_(devicesAtLeast) {
+    : groups_(groups.size()),
+      earlier_(earlier.size()),
+      days_(table.days().size()),
+      devicesAtLeast_(devicesAtLeast) {
   std::vector<std::uint32_t> earlierOf(table.size());
   for (std::uint32_t i = 0; i < earlier_; ++i)
     earlier[i]->forEach([&](LogIndex log) { earlierOf[log] = i; });
@@ -52,12 +59,11 @@ Crossing::Crossing(const LogTable& table, const std::vector<const LogSet*>& grou
   }
 }
 
-// A group covers another only when it shares logs with it. So whoever subtracts a group has taken
-// all groups that share logs with it, and whoever takes one has subtracted all those with which it
-// shares many logs: otherwise many remain. Groups that are taken or subtracted only together form a
-// component. When intersections remain between components, some of them can be left over alone.
-std::optional<std::size_t> Crossing::groupToJoin(const std::vector<bool>& isJoined,
-                                                 std::span<const std::size_t> order) const {
+// Whoever subtracts a group has taken all groups of the other division that share logs with it, and
+// whoever takes one has subtracted all those with which it shares many logs: otherwise many remain.
+// Groups that are taken or subtracted only together form a component.
+std::vector<std::size_t> Crossing::groupsToJoin(const std::vector<bool>& isJoined,
+                                                std::span<const std::size_t> order) const {
   Components components(groups_ + earlier_);
   std::optional<std::size_t> joined;
   for (std::size_t group = 0; group < groups_; ++group) {
@@ -95,20 +101,63 @@ std::optional<std::size_t> Crossing::groupToJoin(const std::vector<bool>& isJoin
       }
     }
   }
-  if (between.empty()) return std::nullopt;
 
+  const Few few = componentsThatLeaveFew(between);
+  std::vector<std::size_t> result;
   std::vector<bool> isInvolved(groups_ + earlier_);
-  for (const Cell& cell : between)
-    isInvolved[cell.group] = isInvolved[cell.earlier] = true;
+  for (const std::uint32_t component : few.components)
+    isInvolved[component] = true;
   // Joining groups of one component changes nothing.
-  if (joined && isInvolved[components.of(*joined)]) isInvolved[components.of(*joined)] = false;
-  std::optional<std::size_t> any;
-  for (const std::size_t group : order) {
-    if (isJoined[group]) continue;
-    if (isInvolved[components.of(group)]) return group;
-    if (!any) any = group;
+  if (joined) isInvolved[components.of(*joined)] = false;
+  for (const bool wantsInvolved : {true, false}) {
+    for (const std::size_t group : order) {
+      if (result.size() < few.groupsToJoin && !isJoined[group] &&
+          isInvolved[components.of(group)] == wantsInvolved) {
+        result.push_back(group);
+      }
+    }
+    if (!result.empty()) break;
   }
-  return any;
+  return result;
+}
+
+Crossing::Few Crossing::componentsThatLeaveFew(const std::vector<Cell>& between) const {
+  std::vector<std::uint32_t> components;
+  for (const Cell& cell : between)
+    components.insert(components.end(), {cell.group, cell.earlier});
+  std::ranges::sort(components);
+  const auto repeated = std::ranges::unique(components);
+  components.erase(repeated.begin(), repeated.end());
+  if (components.size() > kMostComponents)
+    return {components, (components.size() - kMostComponents + 1) / 2};
+
+  const auto bitOf = [&](std::uint32_t component) {
+    return std::size_t{1} << (std::ranges::lower_bound(components, component) - components.begin());
+  };
+  struct Remainder {
+    std::size_t taken;
+    std::size_t subtracted;
+    const Cell* cell;
+  };
+  std::vector<Remainder> remainders;
+  for (const Cell& cell : between)
+    remainders.push_back({bitOf(cell.group), bitOf(cell.earlier), &cell});
+  std::vector<std::size_t> logsOf(days_);
+  for (std::size_t chosen = 1; chosen < std::size_t{1} << components.size(); ++chosen) {
+    const bool isPossible = std::ranges::all_of(remainders, [&](const Remainder& one) {
+      return (chosen & one.subtracted) == 0 || (chosen & one.taken) != 0;
+    });
+    if (!isPossible) continue;
+    std::fill(logsOf.begin(), logsOf.end(), 0);
+    std::vector<std::uint32_t> ends;
+    const bool areFew = std::ranges::all_of(remainders, [&](const Remainder& one) {
+      if ((chosen & one.taken) == 0 || (chosen & one.subtracted) != 0) return true;
+      ends.insert(ends.end(), {one.cell->group, one.cell->earlier});
+      return (logsOf[one.cell->day] += one.cell->logs) < devicesAtLeast_;
+    });
+    if (areFew && !ends.empty()) return {std::move(ends), 1};
+  }
+  return {};
 }
 
 }  // namespace tavrel::fleet

@@ -8,7 +8,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <memory>
-#include <optional>
 #include <span>
 #include <vector>
 
@@ -24,11 +23,11 @@ class Crossing {
   Crossing(const LogTable& table, const std::vector<const LogSet*>& groups, const Sets& earlier,
            std::size_t devicesAtLeast);
 
-  /// Nothing when fewer devices than `devicesAtLeast` cannot be derived, given that the joined
-  /// groups count as one. Otherwise the first group of `order` that should join them; nothing
-  /// small can be derived at the latest when all are joined.
-  std::optional<std::size_t> groupToJoin(const std::vector<bool>& isJoined,
-                                         std::span<const std::size_t> order) const;
+  /// Empty when fewer devices than `devicesAtLeast` cannot be derived, given that the joined groups
+  /// count as one. Otherwise groups that should join them, the first of `order` that may help;
+  /// nothing small can be derived at the latest when all are joined.
+  std::vector<std::size_t> groupsToJoin(const std::vector<bool>& isJoined,
+                                        std::span<const std::size_t> order) const;
 
  private:
   /// The logs of one day in a group and an earlier group.
@@ -39,8 +38,17 @@ class Crossing {
     std::uint32_t logs;
   };
 
+  struct Few {
+    std::vector<std::uint32_t> components;
+    std::size_t groupsToJoin = 0;
+  };
+  /// `between` are the intersections of components. Returns components some of which could leave
+  /// few devices.
+  Few componentsThatLeaveFew(const std::vector<Cell>& between) const;
+
   const std::size_t groups_;
   const std::size_t earlier_;
+  const std::size_t days_;
   const std::size_t devicesAtLeast_;
   std::vector<Cell> cells_;
 };

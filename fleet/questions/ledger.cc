@@ -1,7 +1,6 @@
 #include "fleet/questions/ledger.h"
 
 #include <algorithm>
-#include <optional>
 #include <utility>
 
 #include "fleet/questions/crossing.h"
@@ -123,17 +122,19 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   };
   for (const Part& part : parts)
     if (!part.isAllowed) join(part.position);
-  const auto groupToJoin = [&]() -> std::optional<std::size_t> {
+  const auto groupsToJoin = [&]() -> std::vector<std::size_t> {
     if (joined != 0 && !ledger.allows(subject, other))
-      return *std::ranges::find(order, false, [&](std::size_t i) { return isJoined[i]; });
-    for (const Crossing& crossing : crossings)
-      if (const auto group = crossing.groupToJoin(isJoined, order)) return group;
-    return std::nullopt;
+      return {*std::ranges::find(order, false, [&](std::size_t i) { return isJoined[i]; })};
+    for (const Crossing& crossing : crossings) {
+      auto found = crossing.groupsToJoin(isJoined, order);
+      if (!found.empty()) return found;
+    }
+    return {};
   };
   while (joined < groups.size()) {
-    const auto group = groupToJoin();
-    if (!group) break;
-    join(*group);
+    const std::vector<std::size_t> found = groupsToJoin();
+    if (found.empty()) break;
+    std::ranges::for_each(found, join);
   }
   if (joined == groups.size()) return division;
 
