@@ -41,10 +41,12 @@ struct Sample {
 
   void add(LogIndex log, std::int64_t value) {
     logs.insert(log);
+    isEmpty = false;
     moments.add(value);
   }
   void add(LogIndex log, const FiveNumbers& numbers) {
     logs.insert(log);
+    isEmpty = false;
     if (hasMean(numbers)) {
       moments.add(numbers.mean);
     } else {
@@ -52,11 +54,11 @@ struct Sample {
       withoutMean->insert(log);
     }
   }
-  LogSet withMean() const { return withoutMean ? logs.without(*withoutMean) : logs; }
 
   const LogTable& table;
-  LogSet logs;
-  std::optional<LogSet> withoutMean;
+  LogMarks logs;
+  std::optional<LogMarks> withoutMean;
+  bool isEmpty = true;
   ExactMoments moments;
 };
 
@@ -95,11 +97,12 @@ struct SideResult {
 };
 using KeyResult = std::array<SideResult, 2>;
 
-std::optional<Measured> measure(const Sample& sample, const LogSet& withMean) {
+std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
+                                const LogSet& withMean) {
   Measured result;
   ComparedSide& side = result.side;
   side.logs = withMean.logs();
-  side.logsWithoutMean = sample.logs.logs() - side.logs;
+  side.logsWithoutMean = logSet.logs() - side.logs;
   side.devices = withMean.devices(sample.table);
   side.mean = sample.moments.mean();
   const double squared = sample.moments.squaredDeviations();
@@ -114,9 +117,9 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& withMean) {
 }
 
 SideResult resultOf(const Sample& sample) {
-  SideResult result{sample.logs, std::nullopt, std::nullopt};
-  if (sample.withoutMean) result.withMean = sample.withMean();
-  result.measured = measure(sample, result.logsWithMean());
+  SideResult result{sample.logs.set(), std::nullopt, std::nullopt};
+  if (sample.withoutMean) result.withMean = result.logs.without(sample.withoutMean->set());
+  result.measured = measure(sample, result.logs, result.logsWithMean());
   return result;
 }
 
@@ -241,7 +244,7 @@ class Comparer {
       });
     }
     const auto& [before, after] = samples;
-    if (before.logs.empty() || after.logs.empty()) return nullptr;
+    if (before.isEmpty || after.isEmpty) return nullptr;
     return std::make_unique<KeyResult>(KeyResult{resultOf(before), resultOf(after)});
   }
 

@@ -64,9 +64,7 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
   };
   const auto texts = table.texts(of);
   std::vector<std::size_t> counts(byDay ? table.days().size() : texts.size());
-  for (LogIndex log = 0; log < table.size(); ++log) {
-    if (logs.contains(log)) ++counts[valueOf(log)];
-  }
+  logs.forEach([&](LogIndex log) { ++counts[valueOf(log)]; });
   std::vector<std::uint32_t> order;
   std::size_t smallValues = 0;
   for (std::uint32_t value = 0; value < counts.size(); ++value) {
@@ -93,13 +91,10 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
     groupOf[value] = groups.size();
     const std::string text =
         byDay ? dateText(civilFromDays(table.days()[value].day)) : texts[value];
-    groups.push_back(
-        {{text.empty() ? PartKind::kNotReported : PartKind::kValue, text}, LogSet(table)});
+    groups.push_back({{text.empty() ? PartKind::kNotReported : PartKind::kValue, text}, LogSet()});
   }
-  groups.push_back({{PartKind::kOther}, LogSet(table), smallValues});
-  for (LogIndex log = 0; log < table.size(); ++log) {
-    if (logs.contains(log)) groups[groupOf[valueOf(log)]].logs.insert(log);
-  }
+  groups.push_back({{PartKind::kOther}, LogSet(), smallValues});
+  logs.forEach([&](LogIndex log) { groups[groupOf[valueOf(log)]].logs.insert(log); });
   return groups;
 }
 

@@ -11,27 +11,17 @@ bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   if (!hasEnough(logs)) return false;
   const auto found = shown_.find(subject);
   if (found == shown_.end()) return true;
-  const auto& sets = found->second;
-  const bool differsEnough = std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
-    return logs == *other || logs.differsByAtLeast(*other, devicesAtLeast_, table_);
-  });
-  return differsEnough && leavesEnough(logs, sets, logs) &&
-         std::all_of(sets.begin(), sets.end(), [&](const auto& other) {
-           return !other->includes(logs) || leavesEnough(*other, sets, logs);
-         });
-}
-
-bool Ledger::leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& added) const {
-  LogSet parts(table_);
-  const auto take = [&](const LogSet& part) {
-    if (!(part == whole) && whole.includes(part)) parts.add(part);
-  };
-  for (const auto& part : shown)
-    take(*part);
-  take(added);
-  if (parts.empty()) return true;
-  const LogSet rest = whole.without(parts);
-  return rest.empty() || hasEnough(rest);
+  const Sets& sets = found->second;
+  const Sets& rests = rests_.at(subject);
+  LogSet rest = logs;
+  for (std::size_t i = 0; i < sets.size(); ++i) {
+    const LogSet& other = *sets[i];
+    if (logs == other) continue;
+    if (!logs.differsByAtLeast(other, devicesAtLeast_, table_)) return false;
+    if (other.includes(logs) && !isNoneOrEnough(rests[i]->without(logs))) return false;
+    if (!rest.empty() && logs.includes(other)) rest = rest.without(other);
+  }
+  return isNoneOrEnough(rest);
 }
 
 std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, const LogSet& logs) {
@@ -45,8 +35,19 @@ std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, cons
     kept = std::make_shared<const LogSet>(logs);
     known_.emplace(hash, kept);
   }
-  auto& sets = shown_[subject];
-  if (std::find(sets.begin(), sets.end(), kept) == sets.end()) sets.push_back(kept);
+  Sets& sets = shown_[subject];
+  Sets& rests = rests_[subject];
+  if (std::find(sets.begin(), sets.end(), kept) != sets.end()) return kept;
+  std::shared_ptr<const LogSet> rest = kept;
+  const auto take = [](std::shared_ptr<const LogSet>& from, const LogSet& part) {
+    if (!from->empty()) from = std::make_shared<const LogSet>(from->without(part));
+  };
+  for (std::size_t i = 0; i < sets.size(); ++i) {
+    if (sets[i]->includes(logs)) take(rests[i], logs);
+    if (logs.includes(*sets[i])) take(rest, *sets[i]);
+  }
+  sets.push_back(kept);
+  rests.push_back(std::move(rest));
   return kept;
 }
 
@@ -78,7 +79,7 @@ std::string subjectOfMeans(KeyKind kind, const std::string& key) {
 
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups) {
   const LogTable& table = ledger.table();
-  Division division{LogSet(table), false, {}, 0};
+  Division division{{}, false, {}, 0};
   std::erase_if(groups, [](const Group& group) { return group.logs.empty(); });
   for (const Group& group : groups)
     division.whole.add(group.logs);
@@ -111,7 +112,7 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   for (const Ledger::Sets& earlier : ledger.divisionsOf(subject, division.whole))
     crossings.emplace_back(table, sets, earlier, ledger.devicesAtLeast());
 
-  LogSet other(table);
+  LogSet other;
   std::vector<bool> isJoined(groups.size());
   std::size_t joined = 0;
   const auto join = [&](std::size_t position) {

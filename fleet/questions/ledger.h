@@ -46,13 +46,13 @@ class Ledger {
   std::vector<Sets> divisionsOf(const std::string& subject, const LogSet& whole) const;
 
  private:
-  /// Whether the whole, without those of its parts that are already shown or to be shown, is
-  /// empty or has enough devices.
-  bool leavesEnough(const LogSet& whole, const Sets& shown, const LogSet& added) const;
+  bool isNoneOrEnough(const LogSet& logs) const { return logs.empty() || hasEnough(logs); }
 
   const LogTable& table_;
   const std::size_t devicesAtLeast_;
   Shown shown_;
+  /// What each shown set is without its shown parts; the set itself when it has none.
+  Shown rests_;
   struct Parts {
     std::shared_ptr<const LogSet> whole;
     Sets parts;

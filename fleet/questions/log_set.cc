@@ -10,83 +10,181 @@ std::size_t ones(std::uint64_t word) {
   return static_cast<std::size_t>(std::popcount(word));
 }
 
-/// How many of the day's logs are set; `wordAt` yields the words of a set.
-template <class WordAt>
-std::size_t onesOf(const LogTable::Day& day, const WordAt& wordAt) {
-  std::size_t count = 0;
-  for (std::size_t word = day.begin / 64; word * 64 < day.end; ++word) {
-    std::uint64_t bits = wordAt(word);
-    if (word == day.begin / 64) bits &= ~std::uint64_t{0} << day.begin % 64;
-    if (day.end - word * 64 < 64) bits &= (std::uint64_t{1} << (day.end - word * 64)) - 1;
-    count += ones(bits);
+/// Counts the logs of each day, given words in ascending order.
+class DayCounts {
+ public:
+  explicit DayCounts(const LogTable& table) : table_(table) {}
+
+  /// `use` takes the position of a day and the number of its logs so far.
+  template <class Use>
+  void add(std::uint32_t position, std::uint64_t logs, const Use& use) {
+    const LogIndex begin = position * 64;
+    while (logs != 0) {
+      const std::uint32_t day =
+          table_.dayIndex(begin + static_cast<LogIndex>(std::countr_zero(logs)));
+      const LogIndex left = table_.days()[day].end - begin;
+      const std::uint64_t ofDay = left < 64 ? (std::uint64_t{1} << left) - 1 : ~std::uint64_t{0};
+      count_ = (day == day_ ? count_ : 0) + ones(logs & ofDay);
+      day_ = day;
+      logs &= ~ofDay;
+      use(day_, count_);
+    }
   }
-  return count;
-}
+
+ private:
+  const LogTable& table_;
+  std::size_t day_ = 0;
+  std::size_t count_ = 0;
+};
 
 }  // namespace
 
-bool LogSet::empty() const {
-  return std::all_of(words_.begin(), words_.end(), [](std::uint64_t word) { return word == 0; });
+void LogSet::insert(LogIndex log) {
+  const std::uint32_t position = log / 64;
+  auto at = words_.end();
+  if (!words_.empty() && words_.back().position >= position)
+    at = std::ranges::lower_bound(words_, position, {}, &Word::position);
+  if (at == words_.end() || at->position != position) at = words_.insert(at, {position, 0});
+  at->logs |= std::uint64_t{1} << log % 64;
+}
+
+bool LogSet::contains(LogIndex log) const {
+  const std::uint32_t position = log / 64;
+  if (words_.empty() || position < words_.front().position) return false;
+  // Without gaps, the word is here.
+  const std::size_t guess = position - words_.front().position;
+  auto at = words_.end();
+  if (guess < words_.size() && words_[guess].position == position) {
+    at = words_.begin() + static_cast<std::ptrdiff_t>(guess);
+  } else {
+    at = std::ranges::lower_bound(words_, position, {}, &Word::position);
+  }
+  return at != words_.end() && at->position == position && (at->logs >> log % 64 & 1) != 0;
 }
 
 void LogSet::add(const LogSet& other) {
-  for (std::size_t i = 0; i < words_.size(); ++i)
-    words_[i] |= other.words_[i];
+  auto from = other.words_.begin();
+  const auto end = other.words_.end();
+  if (from == end) return;
+  std::vector<Word> rest;  // of this set, from where the other begins
+  const auto begin = std::ranges::lower_bound(words_, from->position, {}, &Word::position);
+  rest.assign(begin, words_.end());
+  words_.erase(begin, words_.end());
+  for (const Word& word : rest) {
+    for (; from != end && from->position < word.position; ++from)
+      words_.push_back(*from);
+    words_.push_back(word);
+    if (from != end && from->position == word.position) words_.back().logs |= (from++)->logs;
+  }
+  words_.insert(words_.end(), from, end);
 }
 
 bool LogSet::includes(const LogSet& other) const {
-  for (std::size_t i = 0; i < words_.size(); ++i)
-    if ((other.words_[i] & ~words_[i]) != 0) return false;
-  return true;
+  if (other.words_.size() > words_.size()) return false;
+  auto at = words_.begin();
+  return std::ranges::all_of(other.words_, [&](const Word& word) {
+    at = std::ranges::lower_bound(at, words_.end(), word.position, {}, &Word::position);
+    return at != words_.end() && at->position == word.position && (word.logs & ~at->logs) == 0;
+  });
 }
 
 std::size_t LogSet::logs() const {
   std::size_t count = 0;
-  for (const std::uint64_t word : words_)
-    count += ones(word);
+  for (const Word& word : words_)
+    count += ones(word.logs);
   return count;
 }
 
 std::size_t LogSet::devices(const LogTable& table) const {
   std::size_t most = 0;
-  for (const LogTable::Day& day : table.days())
-    most = std::max(most, onesOf(day, [&](std::size_t word) { return words_[word]; }));
+  DayCounts counts(table);
+  for (const Word& word : words_) {
+    counts.add(word.position, word.logs,
+               [&](std::size_t, std::size_t logs) { most = std::max(most, logs); });
+  }
   return most;
 }
 
+void LogSet::forEachDay(const LogTable& table,
+                        const std::function<void(std::size_t day, std::size_t logs)>& use) const {
+  std::size_t last = 0;
+  std::size_t count = 0;
+  DayCounts counts(table);
+  for (const Word& word : words_) {
+    counts.add(word.position, word.logs, [&](std::size_t day, std::size_t logs) {
+      if (count != 0 && day != last) use(last, count);
+      last = day;
+      count = logs;
+    });
+  }
+  if (count != 0) use(last, count);
+}
+
 std::vector<std::size_t> LogSet::logsByDay(const LogTable& table) const {
-  std::vector<std::size_t> counts;
-  counts.reserve(table.days().size());
-  for (const LogTable::Day& day : table.days())
-    counts.push_back(onesOf(day, [&](std::size_t word) { return words_[word]; }));
+  std::vector<std::size_t> counts(table.days().size());
+  forEachDay(table, [&](std::size_t day, std::size_t logs) { counts[day] = logs; });
   return counts;
 }
 
 LogSet LogSet::without(const LogSet& other) const {
-  LogSet result = *this;
-  for (std::size_t i = 0; i < words_.size(); ++i)
-    result.words_[i] &= ~other.words_[i];
+  LogSet result;
+  auto at = other.words_.begin();
+  for (const auto& [position, logs] : words_) {
+    while (at != other.words_.end() && at->position < position)
+      ++at;
+    const bool isShared = at != other.words_.end() && at->position == position;
+    const std::uint64_t left = isShared ? logs & ~at->logs : logs;
+    if (left != 0) result.words_.push_back({position, left});
+  }
   return result;
 }
 
 bool LogSet::differsByAtLeast(const LogSet& other, std::size_t devices,
                               const LogTable& table) const {
-  const auto isInOne = [&](std::size_t word) { return words_[word] ^ other.words_[word]; };
-  return std::any_of(table.days().begin(), table.days().end(),
-                     [&](const LogTable::Day& day) { return onesOf(day, isInOne) >= devices; });
+  bool isEnough = false;
+  DayCounts counts(table);
+  const auto add = [&](std::uint32_t position, std::uint64_t logs) {
+    counts.add(position, logs,
+               [&](std::size_t, std::size_t count) { isEnough = isEnough || count >= devices; });
+  };
+  auto a = words_.begin();
+  auto b = other.words_.begin();
+  while (!isEnough && (a != words_.end() || b != other.words_.end())) {
+    if (b == other.words_.end() || (a != words_.end() && a->position < b->position)) {
+      add(a->position, a->logs);
+      ++a;
+    } else if (a == words_.end() || b->position < a->position) {
+      add(b->position, b->logs);
+      ++b;
+    } else {
+      add(a->position, a->logs ^ b->logs);
+      ++a;
+      ++b;
+    }
+  }
+  return isEnough;
 }
 
 std::size_t LogSet::hash() const {
   std::uint64_t result = 0;
-  for (const std::uint64_t word : words_)
-    result = (std::rotl(result, 5) ^ word) * 0x9e3779b97f4a7c15U;
+  for (const Word& word : words_)
+    result = (std::rotl(result, 5) ^ word.logs ^ word.position) * 0x9e3779b97f4a7c15U;
   return static_cast<std::size_t>(result);
 }
 
+LogSet LogMarks::set() const {
+  LogSet result;
+  for (std::uint32_t position = 0; position < words_.size(); ++position)
+    if (words_[position] != 0) result.words_.push_back({position, words_[position]});
+  return result;
+}
+
 LogSet logsOn(const LogTable& table, const DayRange& days) {
-  LogSet logs(table);
-  for (LogIndex log = 0; log < table.size(); ++log) {
-    if (days.contains(table.day(log))) logs.insert(log);
+  LogSet logs;
+  for (const LogTable::Day& day : table.days()) {
+    if (!days.contains(day.day)) continue;
+    for (LogIndex log = day.begin; log < day.end; ++log)
+      logs.insert(log);
   }
   return logs;
 }

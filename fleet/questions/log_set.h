@@ -7,28 +7,27 @@
 #include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <functional>
 #include <vector>
 
 #include "fleet/questions/log_table.h"
 
 namespace tavrel::fleet {
 
+/// Takes memory in proportion to its logs, not to those of the table.
 class LogSet {
  public:
-  /// An empty set.
-  explicit LogSet(const LogTable& table) : words_((table.size() + 63) / 64) {}
-
-  void insert(LogIndex log) { words_[log / 64] |= std::uint64_t{1} << log % 64; }
-  bool contains(LogIndex log) const { return (words_[log / 64] >> log % 64 & 1) != 0; }
+  /// Fast when the logs come in ascending order; see LogMarks for others.
+  void insert(LogIndex log);
+  bool contains(LogIndex log) const;
   template <class Use>
   void forEach(const Use& use) const {
-    for (std::size_t i = 0; i < words_.size(); ++i) {
-      for (std::uint64_t word = words_[i]; word != 0; word &= word - 1) {
-        use(static_cast<LogIndex>(i * 64 + static_cast<std::size_t>(std::countr_zero(word))));
-      }
+    for (const auto& [position, logs] : words_) {
+      for (std::uint64_t word = logs; word != 0; word &= word - 1)
+        use(position * 64 + static_cast<LogIndex>(std::countr_zero(word)));
     }
   }
-  bool empty() const;
+  bool empty() const { return words_.empty(); }
   void add(const LogSet& other);
   bool includes(const LogSet& other) const;
 
@@ -39,11 +38,35 @@ class LogSet {
   std::size_t devices(const LogTable& table) const;
   /// The number of logs of each day of the table.
   std::vector<std::size_t> logsByDay(const LogTable& table) const;
+  /// Hands out the position of each day that has logs, and their number, in ascending order.
+  void forEachDay(const LogTable& table,
+                  const std::function<void(std::size_t day, std::size_t logs)>& use) const;
 
   LogSet without(const LogSet& other) const;
   /// Whether the logs that only one of the two sets has come from at least `devices` devices.
   bool differsByAtLeast(const LogSet& other, std::size_t devices, const LogTable& table) const;
   std::size_t hash() const;
+
+ private:
+  friend class LogMarks;
+
+  /// Of each 64 logs of the table, those that are in the set: never none.
+  struct Word {
+    std::uint32_t position = 0;
+    std::uint64_t logs = 0;
+    bool operator==(const Word&) const = default;
+  };
+
+  std::vector<Word> words_;  // by position
+};
+
+/// A set that takes logs in any order, in memory for all logs of the table.
+class LogMarks {
+ public:
+  explicit LogMarks(const LogTable& table) : words_((table.size() + 63) / 64) {}
+
+  void insert(LogIndex log) { words_[log / 64] |= std::uint64_t{1} << log % 64; }
+  LogSet set() const;
 
  private:
   std::vector<std::uint64_t> words_;

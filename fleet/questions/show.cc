@@ -131,11 +131,12 @@ class SideAnswer {
   void merge(std::vector<ShownSet>& sets, ShownSet& whole) const {
     forEachPart(rows_.distributions, sets, whole, [&](const auto& rows, ShownSet& set) {
       MergedNumbers merged;
-      LogSet withMean(table_);
+      LogMarks marks(table_);
       for (const auto* row : rows) {
         merged.add(row->second);
-        if (hasMean(row->second)) withMean.insert(row->first);
+        if (hasMean(row->second)) marks.insert(row->first);
       }
+      const LogSet withMean = marks.set();
       set.merged = {merged.numbers(), merged.standardDeviation(), merged.logsWithoutMean()};
       if (ledger_.allows(subjectOfMeans_, withMean)) {
         ledger_.noteShown(subjectOfMeans_, withMean);
@@ -208,7 +209,7 @@ class SideAnswer {
 
 /// The logs that have the key and that the request puts on a given side.
 LogSet logsOf(const LogTable& table, const Rows& rows, const auto& isOnSide) {
-  LogSet logs(table);
+  LogMarks logs(table);
   const auto take = [&](const auto& some) {
     for (const auto& [log, value] : some) {
       if (isOnSide(log)) logs.insert(log);
@@ -216,7 +217,7 @@ LogSet logsOf(const LogTable& table, const Rows& rows, const auto& isOnSide) {
   };
   take(rows.scalars);
   take(rows.distributions);
-  return logs;
+  return logs.set();
 }
 
 }  // namespace

@@ -12,14 +12,13 @@ namespace {
 CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogSet& logs) {
   const LogTable& table = ledger.table();
   CountedGroup result{name, logs.logs(), logs.devices(table), 0, 0};
-  const std::vector<std::size_t> counts = logs.logsByDay(table);
   bool isFirst = true;
-  for (std::size_t i = 0; i < counts.size(); ++i) {
-    if (counts[i] < ledger.devicesAtLeast()) continue;
-    if (isFirst) result.firstDay = table.days()[i].day;
+  logs.forEachDay(table, [&](std::size_t day, std::size_t count) {
+    if (count < ledger.devicesAtLeast()) return;
+    if (isFirst) result.firstDay = table.days()[day].day;
     isFirst = false;
-    result.lastDay = table.days()[i].day;
-  }
+    result.lastDay = table.days()[day].day;
+  });
   return result;
 }
 
@@ -27,7 +26,7 @@ CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogS
 
 bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key) {
   const LogTable& table = ledger.table();
-  LogSet logs(table);
+  DeviceCounter logs(table);
   const auto take = [&](const auto& rows) {
     for (const auto& row : rows) {
       const LogIndex log = table.find(row.log);
@@ -45,7 +44,7 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
       engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
       break;
   }
-  return ledger.hasEnough(logs);
+  return logs.devices() >= ledger.devicesAtLeast();
 }
 
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among) {
@@ -63,7 +62,7 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days, Sm
   if (small == SmallVersions::kLeftOut) {
     std::vector<Group> versions = groupsOf(table, logs, GroupBy::kOs, ledger.devicesAtLeast());
     leaveSmallOut(versions, ledger);
-    logs = LogSet(table);
+    logs = LogSet();
     for (const Group& version : versions)
       logs.add(version.logs);
   }

@@ -175,7 +175,7 @@ void expectNothingSmallFollows(const Ledger& ledger) {
       std::vector<bool> in;
       for (const auto& set : sets)
         in.push_back(set->contains(log));
-      cells.try_emplace(in, table).first->second.insert(log);
+      cells.try_emplace(in).first->second.insert(log);
     }
     cells.erase(std::vector<bool>(sets.size()));
     for (const auto& [in, logs] : cells)
@@ -191,7 +191,7 @@ void expectNothingSmallFollowsFromTwo(const std::vector<Division>& divisions,
     for (const Division& other : divisions) {
       if (&one == &other || one.groups.size() > 10) continue;
       for (std::size_t choice = 0; choice < std::size_t{1} << one.groups.size(); ++choice) {
-        LogSet rest(ledger.table());
+        LogSet rest;
         for (std::size_t i = 0; i < one.groups.size(); ++i)
           if ((choice >> i & 1) != 0) rest.add(one.groups[i].logs);
         for (const Group& group : other.groups)
