@@ -126,8 +126,7 @@ Crossing::Few Crossing::componentsThatLeaveFew(const std::vector<Cell>& between)
   for (const Cell& cell : between)
     components.insert(components.end(), {cell.group, cell.earlier});
   std::ranges::sort(components);
-  const auto repeated = std::ranges::unique(components);
-  components.erase(repeated.begin(), repeated.end());
+  components.erase(std::unique(components.begin(), components.end()), components.end());
   if (components.size() > kMostComponents)
     return {components, (components.size() - kMostComponents + 1) / 2};
 
@@ -140,6 +139,7 @@ Crossing::Few Crossing::componentsThatLeaveFew(const std::vector<Cell>& between)
     const Cell* cell;
   };
   std::vector<Remainder> remainders;
+  remainders.reserve(between.size());
   for (const Cell& cell : between)
     remainders.push_back({bitOf(cell.group), bitOf(cell.earlier), &cell});
   std::vector<std::size_t> logsOf(days_);

@@ -103,9 +103,11 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   });
 
   std::vector<std::size_t> order;
+  order.reserve(parts.size());
   for (const Part& part : parts)
     order.push_back(part.position);
   std::vector<const LogSet*> sets;
+  sets.reserve(groups.size() + 1);
   for (const Group& group : groups)
     sets.push_back(&group.logs);
   std::vector<Crossing> crossings;
