@@ -155,12 +155,13 @@ TEST_F(Consent, ShowsWhatIsWithheld) {
   fileLogs({"withheld/StorageStatus-1"});
   EXPECT_NE(device.run("status").out.find("Withheld logs    1, never sent\n"), std::string::npos);
   EXPECT_EQ(device.json("log list")["logs"][0]["place"], "withheld");
-  fileLogs({"refused/log-tallied-2"});
+  fileLogs({"refused/StorageStatus-2"});
   EXPECT_NE(device.run("status").out.find("Refused logs     1, refused by the server\n"),
             std::string::npos);
   EXPECT_EQ(device.json("log list")["logs"][1]["place"], "refused");
-  EXPECT_NE(device.run("log show log-tallied-2").out.find("refused/log-tallied-2.log (refused)\n"),
-            std::string::npos);
+  EXPECT_NE(
+      device.run("log show StorageStatus-2").out.find("refused/StorageStatus-2.log (refused)\n"),
+      std::string::npos);
   EXPECT_EQ(device.json("log show StorageStatus-1")["log"]["text"], "text");
 }
 

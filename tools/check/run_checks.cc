@@ -156,8 +156,9 @@ void checkLastLog(CheckScene& scene) {
   }
   // A device that sends nothing needs no whitelist, but a faulty whitelist is a mistake even there.
   const WhitelistState& whitelist = conclusion.whitelist;
-  if (!whitelist.fault.empty() &&
-      !(whitelist.isMissing && conclusion.outcome == LogOutcome::NotPermitted)) {
+  const bool sendsNothing = conclusion.outcome == LogOutcome::NotPermitted ||
+                            conclusion.outcome == LogOutcome::PermissionUnknown;
+  if (!whitelist.fault.empty() && !(whitelist.isMissing && sendsNothing)) {
     addFinding(check, whitelist.isClosed ? CheckState::Unknown : CheckState::Warning,
                whitelist.fault);
   }
