@@ -163,6 +163,10 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
         "TaskingPayload[2]/value: is not a known key; the known ones are Domain, Key, Value",
         "TaskingPayload[2]/Domain: is missing", "TaskingPayload[2]/Value: is missing",
         "TaskingPayload[4]: sets the same key as an earlier setting"}},
+      {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "com.norvane.zentrix",
+          "Key": "DiagnosticSubmissionFirstDay", "Value": 1}]})",
+       {"TaskingPayload[0]: changes the permission to submit logs, which only the owner may: use "
+        "'tavrelctl allow' or 'tavrelctl deny'"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
        {"TaskingPayload[0]: contains text that preferences cannot store: property lists contain no "
         "control "

@@ -8,6 +8,7 @@
 #include <string_view>
 #include <utility>
 
+#include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "tools/shared/typed_value.h"
 #include "tools/shared/value_text.h"
@@ -101,6 +102,11 @@ std::vector<std::string> checkTasking(const plist::Value& tasking) {
     const auto key = findings.requireText(setting, "Key", path + "/Key");
     if (domain && !FilePreferences::isValidDomain(*domain)) {
       findings.add(path + "/Domain", "is not the name of a preference domain");
+    }
+    if (domain && key && isOfPermission(*domain, *key)) {
+      findings.add(path,
+                   "changes the permission to submit logs, which only the owner may: use "
+                   "'tavrelctl allow' or 'tavrelctl deny'");
     }
     if (!setting.contains("Value")) findings.add(path + "/Value", "is missing");
     if (domain && key && !settings.emplace(*domain, *key).second) {

@@ -5,7 +5,7 @@
 
 #include <string_view>
 
-#include "platform/persisted_state.h"
+#include "platform/linux/logs/submission_permission.h"
 #include "platform/preferences.h"
 #include "platform/system_log.h"
 
@@ -23,9 +23,9 @@ class GuardedPreferences final : public Preferences {
   /// Drops a change of the permission, with a log line.
   void ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                               std::string_view domain) override {
-    const bool isPermission = domain == kDiagnosticsDomain &&
-                              (key == kSubmissionEnabledKey || key == kSubmissionFirstDayKey);
-    if (!isPermission) return preferences_.ZTXPreferencesSetValue(key, value, domain);
+    if (!isOfPermission(domain, key)) {
+      return preferences_.ZTXPreferencesSetValue(key, value, domain);
+    }
     log_.log(
         LogLevel::Error,
         "a tasking may not change preference %s of domain %s: only the owner allows submission",

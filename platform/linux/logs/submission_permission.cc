@@ -33,6 +33,11 @@ Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& prefe
                               firstDayOf(values->get(kSubmissionFirstDayKey))};
 }
 
+bool isOfPermission(std::string_view domain, std::string_view key) {
+  return domain == kDiagnosticsDomain &&
+         (key == kSubmissionEnabledKey || key == kSubmissionFirstDayKey);
+}
+
 void setSubmissionPermission(Preferences& preferences, const SubmissionPermission& permission) {
   preferences.ZTXPreferencesSetValue(kSubmissionEnabledKey, permission.isGiven, kDiagnosticsDomain);
   preferences.ZTXPreferencesSetValue(

@@ -11,6 +11,7 @@
 #include <limits>
 #include <optional>
 #include <string>
+#include <string_view>
 
 #include "base/expected.h"
 #include "base/plist.h"
@@ -43,6 +44,9 @@ SubmissionPermission submissionPermission(Preferences& preferences);
 
 /// The permission as storage has it at this moment; an error when it cannot be read.
 Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& preferences);
+
+/// Whether a preference is one of these two, which no tasking may change.
+bool isOfPermission(std::string_view domain, std::string_view key);
 
 /// Sets both preferences; the caller synchronises the domain.
 void setSubmissionPermission(Preferences& preferences, const SubmissionPermission& permission);
