@@ -1,13 +1,17 @@
 // tavrel-statsd: records what programs send as StatsD datagrams.
+#include <cerrno>
 #include <cstdio>
+#include <cstdlib>
 #include <getopt.h>
 #include <string>
 #include <string_view>
+#include <unistd.h>
 #include <vector>
 
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "base/program.h"
+#include "base/system_text.h"
 #include "base/version.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
@@ -89,8 +93,8 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
       case kShowHelp:
         std::fputs(kHelp, stdout);
         return 0;
-      default:
-        return 2;
+      default:  // getopt has said what is wrong
+        return misuse("see --help");
     }
   }
   if (optind < argc) return refuseArgument("tavrel-statsd", argv[optind]);
@@ -114,9 +118,19 @@ Expected<std::vector<DatagramSocket>> openSockets(const Options& options) {
   return sockets;
 }
 
+// libbrimhold would only say that it cannot record.
+bool isRootMissing() {
+  const char* const root = std::getenv("TAVREL_ROOT");
+  if (root == nullptr || *root == 0 || access(root, F_OK) == 0) return false;
+  complain(format("cannot use device root %s: %s: name the device's folder with TAVREL_ROOT", root,
+                  systemText(errno)));
+  return true;
+}
+
 int run(int argc, char** argv) {
   Options options;
   if (const auto status = parseOptions(argc, argv, options)) return *status;
+  if (isRootMissing()) return 1;
   const auto sockets = openSockets(options);
   if (!sockets) {
     complain(sockets.error().message);

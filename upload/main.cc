@@ -79,7 +79,8 @@ int run(int argc, char** argv) {
       case 'v':
         std::printf("tavrel-upload %s\n", std::string(version()).c_str());
         return kDone;
-      default:
+      default:  // getopt has said what is wrong
+        std::fputs("tavrel-upload: see --help\n", stderr);
         return kMisused;
     }
   }

@@ -170,6 +170,9 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
        "not a prefix: a b: give letters, digits, '.', '_' and '-', at most 200\n"},
       {"--idle 86401", 2, "not a time: 86401: give 0 to 86400 seconds\n"},
       {"--idle 86400 --udp 65535 x", 2, "unexpected argument 'x': see --help\n"}};
+  EXPECT_EQ(outputOf("TAVREL_ROOT=/none " + kProgram, 1),
+            "tavrel-statsd: cannot use device root /none: No such file or directory: name the "
+            "device's folder with TAVREL_ROOT\n");
   for (const auto& [options, status, message] : cases)
     EXPECT_EQ(outputOf(kProgram + " " + options, status), "tavrel-statsd: " + message);
   EXPECT_TRUE(std::filesystem::is_regular_file(file));
