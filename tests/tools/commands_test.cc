@@ -20,6 +20,10 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {"log --frob", "no option '--frob': see 'tavrelctl log --help'"},
       {"log frob", "no subcommand 'frob': see 'tavrelctl log --help'"},
       {"log", "A subcommand is required: see 'tavrelctl log --help'"},
+      {"log list --limit 5", "no option '--limit': see 'tavrelctl log list --help'"},
+      {"log list x", "unexpected argument 'x': see 'tavrelctl log list --help'"},
+      {"prefs set d k -inf --float",
+       "no option '-inf': put -- before it if it is a value: see 'tavrelctl prefs set --help'"},
       {"prefs get a", "KEY is required: see 'tavrelctl prefs get --help'"},
       {"prefs get ../a k",
        "not a preference domain: ../a: give a name such as com.example.app, without slashes"},
@@ -86,6 +90,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
     EXPECT_EQ(error.str(), line);
   }
   device.check("--version", prints(format("tavrelctl %s\n", version())));
+  EXPECT_NE(device.run("prefs set --help").out.find("\n\nKind of VALUE, at most one:\n  --string "),
+            std::string::npos);
   for (const auto& help : {"--help", "prefs set --help", "log --help"})
     EXPECT_NE(device.run(help).out.find("Usage: "), std::string::npos) << help;
 }
@@ -95,6 +101,7 @@ TEST(Prefs, KeepTheKindThatWasAskedFor) {
   const std::tuple<std::string, std::string, std::string, std::string> kCases[] = {
       {"--string", "a b", "a b\n", R"("a b")"},
       {"--bool", "yes", "true\n", "true"},
+      {"--bool", "False", "false\n", "false"},
       {"--int", "-9223372036854775808", "-9223372036854775808\n", "-9223372036854775808"},
       {"--int", "18446744073709551615", "18446744073709551615\n", "18446744073709551615"},
       {"--float", "1e3", "1000.0\n", "1000.0"},
@@ -162,7 +169,7 @@ TEST(Plist, ConvertsBetweenAllForms) {
   EXPECT_FALSE(std::filesystem::exists(no));
   device.check("plist show -",
                fails("standard input: neither a property list nor JSON: it begins neither with "
-                     "\"bplist00\" nor with \"<\""),
+                     "\"bplist00\" nor with \"<\", \"{\" or \"[\""),
                "hello");
   device.check("plist show -",
                fails("standard input: parse error at line 1, column 4: syntax error while parsing "
@@ -303,6 +310,8 @@ TEST(LogShow, DrawsTheTableOfASubmittedLog) {
   const TemporaryDevice device;
   const std::string pending = device.path(kSubmission) + "pending/";
   device.check("log list", prints("no logs\n"));
+  device.check("log show nothing",
+               fails("no log or file nothing: 'tavrelctl log list' shows the logs"));
   const std::string log = xmlOf(R"json({
     "BHCrashLogVersion": 1,
     "BHStartDate": {"$date": "2024-10-04T00:00:00Z"},

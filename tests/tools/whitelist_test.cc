@@ -68,7 +68,10 @@ C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.s f
 TEST(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   const TemporaryDevice device;
   const std::string path = device.path(kWhitelistFile);
-  device.check("whitelist check", fails("cannot read " + path + ": No such file or directory", 2));
+  device.check("whitelist check", fails("cannot read " + path +
+                                            ": No such file or directory: write a whitelist, as "
+                                            "docs/whitelist.md describes it",
+                                        2));
   device.write(kWhitelistFile, "<plist><dict>");
   device.check("whitelist check",
                fails(path + ": XML property list, line 1, column 14: no element found", 2));

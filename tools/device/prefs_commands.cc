@@ -198,7 +198,7 @@ void addKindOptions(Command command, const std::shared_ptr<Arguments>& arguments
         description);
   };
   add("--string", ArgumentKind::Text, "A text (the default)");
-  add("--bool", ArgumentKind::Boolean, "true or false");
+  add("--bool", ArgumentKind::Boolean, "true, yes, on or 1, or false, no, off or 0");
   add("--int", ArgumentKind::Integer, "A decimal integer of at most 64 bits");
   add("--float", ArgumentKind::Real, "A real number");
   add("--date", ArgumentKind::Date, "YYYY-MM-DDTHH:MM:SSZ or YYYY-MM-DD, UTC");

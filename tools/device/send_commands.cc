@@ -82,7 +82,8 @@ void wait(ToolContext& context, const std::string& name, const std::string& time
       name, *seen, std::chrono::milliseconds(static_cast<std::int64_t>(longest * 1000)));
   if (!count) return context.fail(count.error().message);
   if (*count == *seen) {
-    return context.fail(format("%s was not posted within %g seconds", name, longest));
+    return context.fail(
+        format("%s was not posted within %g second%s", name, longest, longest == 1 ? "" : "s"));
   }
   printCount(context, name, *count);
 }

@@ -12,6 +12,7 @@
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
+#include "tools/shared/input_file.h"
 
 namespace tavrel {
 
@@ -43,7 +44,7 @@ WhitelistState whitelistState(ToolContext& context) {
     state.isClosed = obstacle == EACCES;
     state.isUsable = false;
     state.fault = bytes.error().message;
-    if (state.isMissing) state.fault += ": write a whitelist, as docs/whitelist.md describes it";
+    if (state.isMissing) state.fault += kWriteWhitelist;
     return state;
   }
   const auto value = platform.propertyLists->decode(asBytes(*bytes));

@@ -125,6 +125,9 @@ Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name
                "list' shows them",
                name, names.size())};
   }
+  if (!found && !FileSystem::status(name)) {
+    return Error{format("no log or file %s: 'tavrelctl log list' shows the logs", name)};
+  }
   if (!found) return file;
   return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
 }

@@ -3,6 +3,7 @@
 #include <CLI/CLI.hpp>
 #include <algorithm>
 #include <cstdint>
+#include <memory>
 #include <optional>
 #include <type_traits>
 #include <utility>
@@ -20,6 +21,13 @@ std::string withoutLeadingZeros(std::string text) {
   if (isDecimal) text.erase(0, std::min(text.find_first_not_of('0'), text.size() - 1));
   return text;
 }
+
+// CLI11 heads a choice with "[Option Group: ...]" and a line of blanks.
+struct ChoiceFormatter final : CLI::Formatter {
+  std::string make_expanded(const CLI::App* choice) const override {
+    return make_groups(choice, CLI::AppFormatMode::Sub);
+  }
+};
 
 }  // namespace
 
@@ -70,6 +78,7 @@ Command Command::addGroup(const char* name, const char* description) const {
 Command Command::addChoice(const char* heading) const {
   CLI::App* const choice = app_->add_option_group(heading);
   choice->require_option(0, 1);
+  app_->formatter(std::make_shared<ChoiceFormatter>());
   return Command(*choice);
 }
 
@@ -103,7 +112,10 @@ Option Command::addFlag(const char* names, bool& target, const char* description
 
 Option Command::addFlag(const char* names, std::function<void()> onGiven,
                         const char* description) const {
-  return Option(*app_->add_flag_callback(names, std::move(onGiven), description));
+  CLI::Option* const flag = app_->add_flag_callback(names, std::move(onGiven), description);
+  const bool isOfChoice = app_->get_name().empty();
+  if (isOfChoice) flag->group(app_->get_group() + ", at most one");
+  return Option(*flag);
 }
 
 void Command::setFooter(std::string text) const {

@@ -17,10 +17,19 @@ std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   }
   std::string fault = error.what();
   const auto unknown = app.remaining(true);
-  if (dynamic_cast<const CLI::RequiredError*>(&error) != nullptr && !unknown.empty() &&
-      command->get_require_subcommand_min() > 0) {
-    const char* const what = unknown.front().starts_with('-') ? "option" : "subcommand";
-    fault = format("no %s '%s'", what, unknown.front());
+  const bool isExtra = dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr;
+  const bool isMissing = dynamic_cast<const CLI::RequiredError*>(&error) != nullptr;
+  if ((isExtra || isMissing) && !unknown.empty()) {
+    const std::string& first = unknown.front();
+    const bool isGroup = command->get_require_subcommand_min() > 0;
+    if (first.starts_with('-')) {
+      fault = format("no option '%s'", first);
+      if (!isGroup && !first.starts_with("--")) fault += ": put -- before it if it is a value";
+    } else if (isGroup) {
+      fault = format("no subcommand '%s'", first);
+    } else if (isExtra) {
+      fault = format("unexpected argument '%s'", first);
+    }
   }
   return format("%s: see '%s --help'", fault, line);
 }

@@ -71,7 +71,8 @@ Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view n
     std::string_view reason = value.error().message;
     if (!reason.starts_with(kNotOne)) return Error{format("%s: %s", name, reason)};
     reason.remove_prefix(kNotOne.size());
-    return Error{format("%s: neither a property list nor JSON%s", name, reason)};
+    return Error{format("%s: neither a property list nor JSON%s%s", name, reason,
+                        reason.ends_with("\"<\"") ? ", \"{\" or \"[\"" : "")};
   }
   return value;
 }

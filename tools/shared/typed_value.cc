@@ -16,13 +16,17 @@ Error notA(std::string_view what, std::string_view text, std::string_view expect
 }
 
 Expected<plist::Value> parseBoolean(std::string_view text) {
+  std::string lower(text);
+  std::ranges::transform(lower, lower.begin(), [](char c) {
+    return c >= 'A' && c <= 'Z' ? static_cast<char>(c - 'A' + 'a') : c;
+  });
   for (const std::string_view yes : {"true", "yes", "on", "1"}) {
-    if (text == yes) return plist::Value(true);
+    if (lower == yes) return plist::Value(true);
   }
   for (const std::string_view no : {"false", "no", "off", "0"}) {
-    if (text == no) return plist::Value(false);
+    if (lower == no) return plist::Value(false);
   }
-  return notA("a boolean", text, "true or false");
+  return notA("a boolean", text, "true, yes, on or 1, or false, no, off or 0");
 }
 
 }  // namespace

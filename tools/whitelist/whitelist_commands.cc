@@ -43,7 +43,10 @@ Expected<Whitelist> readWhitelist(ToolContext& context, const std::string& file)
   auto bytes = file.empty()
                    ? context.linuxPlatform().fileSystem().read(path, limits::kWhitelistBytes)
                    : readInput(context, path, limits::kWhitelistBytes);
-  if (!bytes) return bytes.error();
+  if (!bytes) {
+    const bool isMissing = file.empty() && !FileSystem::status(path);
+    return Error{bytes.error().message + (isMissing ? kWriteWhitelist : "")};
+  }
   const std::string name = path == "-" ? "standard input" : path;
   auto value = plist::read(asBytes(*bytes));
   if (!value) return Error{format("%s: %s", name, value.error().message)};

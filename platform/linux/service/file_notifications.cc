@@ -32,7 +32,12 @@ FileNotifications::FileNotifications(const DeviceRoot& root, SystemLog& log)
     : folder_(root.path(std::string(kServiceFolder) + "/notifications")), log_(log) {}
 
 Expected<std::string> FileNotifications::pathOf(std::string_view name) const {
-  if (!isServiceName(name)) return Error{format("%s is not the name of a notification", name)};
+  if (!isServiceName(name)) {
+    return Error{
+        format("%s is not the name of a notification: give letters, digits, '.', '-' and '_', at "
+               "most %zu",
+               name, limits::kServiceNameBytes)};
+  }
   return format("%s/%s", folder_, name);
 }
 

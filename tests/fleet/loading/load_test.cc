@@ -341,8 +341,7 @@ TEST_F(LoadTest, FilesOnceWhatTwoLoadersBring) {
 TEST_F(LoadTest, SaysHowItIsUsed) {
   EXPECT_EQ(run({}).status, 2);
   EXPECT_EQ(run({"x", "--nonsense"}).error,
-            "tavrel-fleet: The following argument was not expected: --nonsense: see 'tavrel-fleet "
-            "load --help'\n");
+            "tavrel-fleet: no option '--nonsense': see 'tavrel-fleet load --help'\n");
 }
 
 }  // namespace
