@@ -352,6 +352,15 @@ TEST(CompareTest, PutsSmallChangesInWords) {
   EXPECT_EQ(changeText(one), "lower (5 → 5)");
 }
 
+TEST(CompareTest, SaysWhenTheVersionsShareNoStatistic) {
+  FleetPage facts;
+  facts.comparison.emplace();
+  page::HtmlWriter html;
+  writeInShort(html, facts);
+  EXPECT_THAT(std::string(html.written()),
+              testing::HasSubstr(", no statistic could be compared.<"));
+}
+
 TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   TestFleet fleet;
   std::mt19937 random(4);
