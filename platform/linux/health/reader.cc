@@ -285,9 +285,9 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   refreshMemory();
   isSuperseded_ = false;
   // Without commands first, and together: each writing of the memory costs flushes of the flash.
-  const auto others = std::ranges::stable_partition(*drives, isInMemory);
-  isDone = read({drives->begin(), others.begin()}) && isDone;
-  for (auto drive = others.begin(); drive != others.end() && !isSuperseded_; ++drive)
+  const auto others = std::stable_partition(drives->begin(), drives->end(), isInMemory);
+  isDone = read({drives->begin(), others}) && isDone;
+  for (auto drive = others; drive != drives->end() && !isSuperseded_; ++drive)
     isDone = read({drive, 1}) && isDone;
   // Last, because a drive that was just read is not old, whatever the clock showed before.
   if (memory_.forgetOld(moment_.seconds)) {
