@@ -305,6 +305,10 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
   EXPECT_EQ(named[0].name, "ubi0.erases_max");
   EXPECT_EQ(named[0].value, 9);
   EXPECT_EQ(contentOf(root.path("/run/tavrel/health/nvme0.plist")).find("S1"), std::string::npos);
+  ASSERT_TRUE(readAll(900));
+  all = readings();
+  for (const char* drive : {"nvme0", "mtd0"})
+    EXPECT_EQ(all[drive].time, 900) << "the clock was set back";
 }
 
 TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
@@ -366,21 +370,72 @@ TEST_F(HealthReaderTest, ADriveThatIsBeingReadKeepsNoOtherWaiting) {
 }
 
 TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
-  addNvme("nvme0", "S1");
-  addNvme("nvme1", "S2");
+  for (const char* name : {"nvme0", "nvme1", "nvme2"})
+    addNvme(name, name);
   run(1);
   ASSERT_TRUE(readAll(1000));
   run(2);
   answers.whileAsked = [this] {
     run(3);
     put(*answers.smart, 48, {4});
-    EXPECT_FALSE(readAll(3000)) << "nvme0 is being read";
+    answers.killer = "nvme2";
+    EXPECT_THROW(readAll(3000), std::bad_alloc);
+    answers.killer = "none";
   };
   ASSERT_TRUE(readAll(2000));
-  EXPECT_EQ(readings()["nvme0"].time, 2000);
+  EXPECT_EQ(readings()["nvme0"].time, 2000) << "the later run has left it out";
   EXPECT_EQ(readings()["nvme1"].time, 3000);
+  EXPECT_EQ(readings()["nvme2"].time, 2000) << "the later run has not read it";
   EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 2 * 512'000);
   EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 2 * 512'000);
+}
+
+// Lets something happen right before the remembered counters are locked.
+class InterruptedFiles final : public FileSystem {
+  int openFile(const char* path, int flags, mode_t mode) override {
+    if (std::string_view(path).ends_with("/health/.lock")) {
+      if (const auto now = std::exchange(beforeLock, nullptr)) now();
+    }
+    return FileSystem::openFile(path, flags, mode);
+  }
+
+ public:
+  std::function<void()> beforeLock;
+};
+
+TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
+  const std::string counter = "/sys/class/mtd/mtd0/corrected_bits";
+  for (const std::int64_t other : {1900, 2100}) {
+    run(other);
+    write(counter, "1000000\n");
+    ASSERT_TRUE(readAll(1000));
+    run(2000);
+    InterruptedFiles late;
+    late.beforeLock = [&] {
+      write(counter, "1000001\n");
+      EXPECT_TRUE(readAll(other));
+    };
+    ASSERT_TRUE(HealthReader(root, late, answers, log).readAll(2000));
+    Reading reading = readings()["mtd0"];
+    EXPECT_EQ(reading.time, std::max<std::int64_t>(other, 2000));
+    EXPECT_EQ(valuesOf(reading.figures), (Values{{"corrected_bits", 1'000'001}}));
+    EXPECT_EQ(valuesOf(reading.growth), (Values{{"corrected_bits", 1}}));
+  }
+}
+
+TEST_F(HealthReaderTest, ADriveIsLockedUntilItsReadingIsStored) {
+  addNvme("nvme0", "S1");
+  run(1);
+  ASSERT_TRUE(readAll(1000));
+  run(2);
+  put(*answers.smart, 48, {3});
+  InterruptedFiles late;
+  late.beforeLock = [this] {
+    put(*answers.smart, 48, {4});
+    EXPECT_FALSE(readAll(3000)) << "nvme0 is being read";
+  };
+  ASSERT_TRUE(HealthReader(root, late, answers, log).readAll(2000));
+  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000);
 }
 
 TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {

@@ -121,16 +121,15 @@ void HealthReader::readNvme(const Drive& drive, Reading& reading) {
   reading.from += ", log C0h";
 }
 
-Reading HealthReader::readDrive(const Drive& drive, bool& isDriveAsleep) {
-  isDriveAsleep = isLeftAsleep(drive);
+std::optional<Reading> HealthReader::readDrive(const Drive& drive) {
+  if (isLeftAsleep(drive)) return std::nullopt;
   Reading reading = emptyReading(drive);
-  if (isDriveAsleep) return reading;
   if (drive.kind == DriveKind::Nvme) {
     readNvme(drive, reading);
   } else if (drive.kind == DriveKind::Ata) {
     const auto blob = commands_.ataSmart(drive.deviceFile);
-    isDriveAsleep = blob && blob->empty();
-    if (!isDriveAsleep) take(blob ? ataFigures(*blob) : blob.error(), "ATA SMART", reading);
+    if (blob && blob->empty()) return std::nullopt;
+    take(blob ? ataFigures(*blob) : blob.error(), "ATA SMART", reading);
   } else {
     if (drive.kind == DriveKind::Emmc) {
       const auto extCsd = commands_.extCsd(drive.deviceFile);
@@ -138,6 +137,11 @@ Reading HealthReader::readDrive(const Drive& drive, bool& isDriveAsleep) {
     }
     // Without permission to ask the card, use what the kernel has read from it.
     if (reading.from.empty()) reading = readWithoutCommands(drive);
+  }
+  reading.time = moment_.seconds;
+  reading.boot = moment_.boot;
+  if (!reading.error.empty()) {
+    log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
   }
   return reading;
 }
@@ -156,15 +160,12 @@ Expected<Descriptor> HealthReader::lockMemory() {
   return lock;
 }
 
-// When another run has written the memory since, because a drive kept this one waiting, that run
-// has read the other drives.
 void HealthReader::refreshMemory() {
   const std::string path = root_.path(kMemoryFile);
   const auto content = files_.readIfPresent(path, limits::kHealthMemoryBytes);
   const auto found = content ? *content : std::optional(content.error().message);
   if (found == memoryFile_) return;
   memoryFile_ = found;
-  isSuperseded_ = true;
   auto memory = !content   ? Expected<Memory>(content.error())
                 : *content ? decodeMemory(asBytes(**content))
                            : Memory();
@@ -224,49 +225,69 @@ bool HealthReader::removeGone(const std::vector<Drive>& drives) {
   return true;
 }
 
-// Reads drives and then stores once what is remembered of them.
-bool HealthReader::read(std::span<const Drive> drives) {
-  bool isDone = true;
-  std::vector<std::pair<std::string, Reading>> taken;  // with the identity of the drive
-  for (const Drive& drive : drives) {
-    std::string identity = identityOf(drive);
-    // Only its name tells a drive from another of the same serial number.
-    if (!identities_.insert(identity).second) identity += '/' + drive.name;
-    // A process that waits for a drive which never answers cannot even be killed.
-    const auto lock = isInMemory(drive)
-                          ? Descriptor()
-                          : files_.lockFile(lockPath('.' + drive.name), kDrivePatience);
-    if (!lock) {
-      log_.log(LogLevel::Error, "no health of %s: %s", drive.name, lock.error().message);
-      isDone = false;
-      continue;
-    }
-    bool isDriveAsleep = false;
-    Reading reading = readDrive(drive, isDriveAsleep);
-    if (isDriveAsleep) continue;
-    reading.time = moment_.seconds;
-    reading.boot = moment_.boot;
-    if (!reading.error.empty()) {
-      log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
-    }
-    taken.emplace_back(std::move(identity), std::move(reading));
-  }
-  if (taken.empty()) return isDone;
-  const auto lock = lockMemory();
+std::string HealthReader::claimIdentity(const Drive& drive) {
+  std::string identity = identityOf(drive);
+  // Only its name tells a drive from another of the same serial number.
+  if (!identities_.insert(identity).second) identity += '/' + drive.name;
+  return identity;
+}
+
+bool HealthReader::isReadByLaterRun(const std::string& identity) const {
+  const auto now = memory_.drives.find(identity);
+  if (now == memory_.drives.end() || now->second.seen < moment_.seconds) return false;
+  const auto before = atStart_.drives.find(identity);
+  // A time that was there at the start is from before the clock was set back.
+  return before == atStart_.drives.end() || before->second.seen != now->second.seen;
+}
+
+bool HealthReader::store(std::span<Taken> taken, bool isMemoryLocked) {
   bool hasGrowth = false;
   for (auto& [identity, reading] : taken) {
-    if (!reading.error.empty() || !hasRunDay_ || !lock) continue;
+    if (!reading.error.empty() || !hasRunDay_ || !isMemoryLocked) continue;
     reading.growth = takeGrowth(memory_.drives[identity], reading.figures, moment_);
     hasGrowth = true;
   }
   // Store the memory before anybody sees the growth, or the next run would count it again: the
   // next drive may never answer.
-  const bool isKept = lock && (!hasGrowth || keep());
+  const bool isKept = isMemoryLocked && (!hasGrowth || keep());
+  bool isDone = isKept;
   for (auto& [identity, reading] : taken) {
     if (!isKept) reading.growth.clear();
     isDone = write(reading) && isDone;
   }
-  return isKept && isDone;
+  return isDone;
+}
+
+// Under one lock, so that no other run stores later figures in between.
+bool HealthReader::readInMemory(std::span<const Drive> drives) {
+  if (drives.empty()) return true;
+  const auto lock = lockMemory();
+  std::vector<Taken> taken;
+  for (const Drive& drive : drives) {
+    std::string identity = claimIdentity(drive);
+    if (isReadByLaterRun(identity)) continue;
+    if (auto reading = readDrive(drive))
+      taken.emplace_back(std::move(identity), *std::move(reading));
+  }
+  return store(taken, static_cast<bool>(lock));
+}
+
+// Locks the memory only after the drive has answered, since others wait for the memory.
+bool HealthReader::readWithCommands(const Drive& drive) {
+  std::string identity = claimIdentity(drive);
+  // A process that waits for a drive which never answers cannot even be killed.
+  const auto driveLock = files_.lockFile(lockPath('.' + drive.name), kDrivePatience);
+  if (!driveLock) {
+    log_.log(LogLevel::Error, "no health of %s: %s", drive.name, driveLock.error().message);
+    return false;
+  }
+  refreshMemory();
+  if (isReadByLaterRun(identity)) return true;
+  auto reading = readDrive(drive);
+  if (!reading) return true;
+  const auto lock = lockMemory();
+  Taken taken(std::move(identity), *std::move(reading));
+  return store({&taken, 1}, static_cast<bool>(lock));
 }
 
 bool HealthReader::readAll(std::int64_t nowSeconds) {
@@ -283,12 +304,12 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   moment_ = {nowSeconds, bootIDOf(root_), runDay ? *runDay : std::nullopt};
   bool isDone = hasRunDay_;
   refreshMemory();
-  isSuperseded_ = false;
+  atStart_ = memory_;
   // Without commands first, and together: each writing of the memory costs flushes of the flash.
   const auto others = std::stable_partition(drives->begin(), drives->end(), isInMemory);
-  isDone = read({drives->begin(), others}) && isDone;
-  for (auto drive = others; drive != drives->end() && !isSuperseded_; ++drive)
-    isDone = read({drive, 1}) && isDone;
+  isDone = readInMemory({drives->begin(), others}) && isDone;
+  for (const Drive& drive : std::span(others, drives->end()))
+    isDone = readWithCommands(drive) && isDone;
   // Last, because a drive that was just read is not old, whatever the clock showed before.
   if (memory_.forgetOld(moment_.seconds)) {
     const auto lock = lockMemory();

@@ -6,6 +6,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "platform/linux/files/device_root.h"
@@ -44,9 +45,18 @@ class HealthReader {
   /// The same, and keeps other runs from changing it.
   Expected<Descriptor> lockMemory();
   Expected<std::optional<std::int64_t>> lastRunDay();
-  bool read(std::span<const Drive> drives);
-  Reading readDrive(const Drive& drive, bool& isAsleep);
+  /// What the memory calls a drive. To be called once for each drive of a run.
+  std::string claimIdentity(const Drive& drive);
+  /// Whether a run that began later has stored a reading of the drive, while this one waited.
+  bool isReadByLaterRun(const std::string& identity) const;
+  bool readInMemory(std::span<const Drive> drives);
+  bool readWithCommands(const Drive& drive);
+  /// Nothing when the drive sleeps.
+  std::optional<Reading> readDrive(const Drive& drive);
   void readNvme(const Drive& drive, Reading& reading);
+  using Taken = std::pair<std::string, Reading>;  // with the identity of the drive
+  /// Stores once what is remembered of drives, then their readings.
+  bool store(std::span<Taken> taken, bool isMemoryLocked);
   bool write(const Reading& reading);
   bool keep();
   bool removeGone(const std::vector<Drive>& drives);
@@ -59,7 +69,7 @@ class HealthReader {
   bool hasRunDay_ = false;
   Memory memory_;
   std::optional<std::string> memoryFile_;  // when last read or written; or why it is unreadable
-  bool isSuperseded_ = false;              // another run has written the memory meanwhile
+  Memory atStart_;                         // the memory when the run began
   std::set<std::string> identities_;       // of the drives looked at
 };
 
