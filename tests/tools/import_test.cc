@@ -297,9 +297,12 @@ struct SlowPace final : CollectPace {
   Ticks time;
 };
 
-// Waits as long as requested, and ends a run after some readings.
+// Waits as long as requested, and ends a run after some readings. The machine starts at midnight.
 struct PeriodicPace final : CollectPace {
   Ticks now() override { return time; }
+  std::chrono::system_clock::time_point wallTime() override {
+    return std::chrono::sys_days(std::chrono::days(20000)) + time.time_since_epoch();
+  }
   bool endsBefore(Ticks end) override {
     time = end;
     between();
@@ -392,6 +395,63 @@ TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
   for (const char* values : {"usage.network.received_kib=120 ", "usage.samples=4 ",
                              "received_kib_per_second=0.5 ", "received_kib_per_second=1 "})
     EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
+}
+
+TEST(StatCommands, SamplesDoNotWaitIntoTheNextDay) {
+  const TemporaryDevice device;
+  PeriodicPace pace;
+  pace.time = PeriodicPace::Ticks(std::chrono::minutes(24 * 60 - 2));
+  pace.left = 3;
+  std::string kept;
+  pace.between = [&] {
+    kept += std::to_string(exported(device).find("usage.samples=2 ") != std::string::npos);
+  };
+  EXPECT_EQ(sample(device, "", pace), storeNote(device));
+  EXPECT_EQ(kept, "0011") << "the sample of 23:59, before that of 24:00";
+}
+
+TEST(StatCommands, SamplesWaitForAStoreThatCannotBeWritten) {
+  for (const bool recovers : {true, false}) {
+    const TemporaryDevice device;
+    device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
+    const std::string store = device.path("/var/mobile/Library/Brimhold");
+    const auto mendStore = [&] {
+      std::filesystem::remove(store);
+      std::filesystem::rename(store + "-x", store);
+    };
+    PeriodicPace pace;
+    int readings = 0;
+    pace.between = [&] {
+      ++readings;  // 30 KiB each
+      device.write("/proc/net/dev", format("\n\neth0: %d 0 0 0 0 0 0 0 0 0\n", 30720 * readings));
+      if (readings == 62 && recovers) mendStore();
+    };
+    const auto sampleTimes = [&](int count) {
+      pace.left = count;
+      return sample(device, "", pace);
+    };
+    EXPECT_EQ(sampleTimes(1), storeNote(device));
+    readings = 1;
+    std::filesystem::rename(store, store + "-x");
+    std::ofstream(store) << "";
+    const std::string why =
+        "tavrelctl: statistics store " + device.path(kStore) +
+        ": its folder cannot be made: Not a directory: check owner and permissions of " +
+        device.path("/var/mobile/Library");
+    EXPECT_EQ(sampleTimes(recovers ? 62 : 200),
+              storeNote(device) + why + "; the samples wait, and the next one tries again\n" +
+                  (recovers ? "" : why + "\nfailed"));
+    EXPECT_EQ(readings, recovers ? 64 : 122) << "gives up after two hours";
+    if (!recovers) {
+      mendStore();
+      EXPECT_EQ(sampleTimes(1), storeNote(device));
+    }
+    // A process that gives up leaves its sums to the next one.
+    const std::string all = exported(device);
+    for (const std::string& value : {format("received_kib=%d ", 30 * (readings - 2)),
+                                     format("samples=%d ", recovers ? 63 : 2)})
+      EXPECT_NE(all.find(value), std::string::npos) << value << all;
+  }
 }
 
 TEST(CollectState, IsOfThisStartAndNoOlderThanADay) {

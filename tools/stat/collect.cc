@@ -55,13 +55,13 @@ class Collector {
 
   void startFrom(std::optional<CollectState> last) { last_ = std::move(last); }
 
-  void read(std::chrono::nanoseconds at) {
-    const ValueTime time = valueTimeNow();
+  void read(std::chrono::nanoseconds at, ValueTime time) {
     const auto processes =
         count_ % readingsPerCount_ == 0 ? Processes::Counted : Processes::LeftOut;
     CollectState now{.at = at, .machine = sources_.read(processes), .remainders = {}};
     const MachineReading* const before = last_ ? &last_->machine : nullptr;
     const double secondsBetween = last_ ? std::chrono::duration<double>(at - last_->at).count() : 0;
+    if (waiting_ == 0) before_ = last_;
     if (last_) now.remainders = std::move(last_->remainders);
     for (const MachineStatistic& statistic : machineStatistics()) {
       const auto value = statistic.measure(now.machine, before, secondsBetween);
@@ -73,26 +73,29 @@ class Collector {
   }
 
   bool hasWaiting() const { return waiting_ > 0; }
-  /// Whether values wait that belong to an earlier day than the last ones.
-  bool spansDays() const {
-    return !values_.empty() && values_.front().time.day != values_.back().time.day;
-  }
+  /// The earliest day to which values belong that wait; there must be some.
+  std::int32_t firstDay() const { return values_.front().time.day; }
   bool isInMemory() const { return recorder_.isInMemory(); }
   /// Whether it is time to keep the values.
   bool isFull() const { return recorder_.isInMemory() || waiting_ >= kReadingsPerTransaction; }
 
+  /// After a failure the values still wait, unless memory has taken them.
   Status keep() {
     for (const TimedValue& value : values_) {
       told_.insert(value.statistic->key);
       if (Status done = keepValue(value); !done) return done;
     }
+    Status done = recorder_.keep();
+    if (!done && !isInMemory()) return done;
     values_.clear();
     waiting_ = 0;
-    return recorder_.keep();
+    return done;
   }
 
   /// The last reading; there must have been one.
   const CollectState& state() const { return *last_; }
+  /// The reading before those that wait, if there was one.
+  const std::optional<CollectState>& stateBefore() const { return before_; }
   std::uint64_t count() const { return count_; }
 
   /// Statistics that no reading has provided so far, each preceded by a blank.
@@ -139,6 +142,7 @@ class Collector {
   ValueRecorder& recorder_;
   const std::uint64_t readingsPerCount_;
   std::optional<CollectState> last_;
+  std::optional<CollectState> before_;
   std::vector<TimedValue> values_;
   std::size_t waiting_ = 0;  // readings
   std::uint64_t count_ = 0;
@@ -195,7 +199,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
   {
     StatProgress progress(context);
     for (;; ++second) {
-      collector.read(pace.now().time_since_epoch());
+      collector.read(pace.now().time_since_epoch(), valueTimeAt(pace.wallTime()));
       progress.show(format("collecting: %u of %u seconds", second, seconds));
       const bool isLast = second == seconds;
       // Keep the values before the wait: a reading counts for the day on which it is made.
@@ -233,17 +237,17 @@ class SingleReadings {
         boot_(bootIDOf(context.root())),
         collector_(context, recorder, 1) {}
 
-  void take(std::chrono::nanoseconds now) {
+  void take(std::chrono::nanoseconds now, ValueTime time) {
     // Another process may have taken a reading since the last one was left.
     if (!collector_.hasWaiting() && !hasLostState_) startFromState(now);
     if (!collector_.hasWaiting()) waitingSince_ = now;
-    collector_.read(now);
+    collector_.read(now, time);
   }
 
   /// Whether values for the store may wait for a next reading at `next`: fewer transactions are
-  /// less wear. The values of a day never wait longer than that, for the log of the day.
-  bool mayWait(std::chrono::nanoseconds next) const {
-    return !collector_.isInMemory() && !collector_.spansDays() &&
+  /// less wear. They do not wait into the next day, whose first run reports them.
+  bool mayWait(std::chrono::nanoseconds next, ValueTime nextTime) const {
+    return !collector_.isInMemory() && nextTime.day == collector_.firstDay() &&
            next - waitingSince_ < kLongestWait;
   }
 
@@ -262,11 +266,33 @@ class SingleReadings {
       }
     }
     hasLostState_ = !left;
-    return collector_.keep();
+    Status kept = collector_.keep();
+    if (!kept && !collector_.isInMemory()) restoreState();
+    return kept;
+  }
+
+  /// As `keep`, but values that the store does not take wait for the next reading, up to an hour
+  /// longer than others.
+  Status keepOrWait(std::chrono::nanoseconds now) {
+    Status kept = keep(true);
+    const bool waits = !kept && !collector_.isInMemory() && now - waitingSince_ < 2 * kLongestWait;
+    if (waits && !isHeldUp_) {
+      context_.note(
+          format("%s; the samples wait, and the next one tries again", kept.error().message));
+    }
+    isHeldUp_ = waits;
+    return waits ? Done{} : kept;
   }
 
  private:
   static constexpr std::chrono::hours kLongestWait{1};
+
+  // The next process, which lacks the values that wait, then adds their sums to its own. When that
+  // fails, they are lost with this process.
+  void restoreState() const {
+    const auto& before = collector_.stateBefore();
+    if (!before || !writeCollectState(path_, boot_, *before)) removeState();
+  }
 
   // From an older reading, a later process would count again what is kept now.
   bool removeState() const {
@@ -289,6 +315,7 @@ class SingleReadings {
   Collector collector_;
   std::chrono::nanoseconds waitingSince_{};
   bool hasLostState_ = false;
+  bool isHeldUp_ = false;  // by a store that takes no values
 };
 
 }  // namespace
@@ -297,7 +324,7 @@ void collectOnce(ToolContext& context, const std::string& stateFile) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
   SingleReadings readings(context, **recorder, stateFile);
-  readings.take(std::chrono::steady_clock::now().time_since_epoch());
+  readings.take(std::chrono::steady_clock::now().time_since_epoch(), valueTimeNow());
   const Status done = readings.keep(false);
   if (!done) context.fail(done.error().message);
 }
@@ -321,8 +348,11 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
   for (Ticks due = pace.now(); kept && !isReplaced && !pace.endsBefore(due);
        due = std::max(due + period, pace.now())) {
     const auto now = pace.now().time_since_epoch();
-    readings.take(now);
-    if (!readings.mayWait(now + period)) kept = readings.keep(true);
+    const auto wallTime = pace.wallTime();
+    readings.take(now, valueTimeAt(wallTime));
+    if (!readings.mayWait(now + period, valueTimeAt(wallTime + period))) {
+      kept = readings.keepOrWait(now);
+    }
     isReplaced = lacksFolder && hasFolder();
   }
   if (kept) kept = readings.keep(true);

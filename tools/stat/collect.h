@@ -16,6 +16,9 @@ class CollectPace {
 
   virtual ~CollectPace() = default;
   virtual Ticks now() = 0;
+  virtual std::chrono::system_clock::time_point wallTime() {
+    return std::chrono::system_clock::now();
+  }
   /// Waits until `end`. Returns true, without waiting any longer, when the readings must end early.
   virtual bool endsBefore(Ticks end) = 0;
 };
@@ -34,7 +37,7 @@ void collectOnce(ToolContext& context, const std::string& stateFile);
 
 /// Does the same now and once every `period`, until `pace` ends it or values cannot be kept.
 /// Without a folder for recording in memory, says so, collects readings for the store for up to an
-/// hour, and ends with a failure when there is one.
+/// hour (two while the store takes none), and ends with a failure when there is one.
 void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile,
                   CollectPace& pace);
 

@@ -4,8 +4,6 @@
 #include <cerrno>
 #include <chrono>
 #include <cstdlib>
-#include <optional>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include "base/format.h"
@@ -26,9 +24,7 @@ namespace {
 class MemoryRecorder final : public ValueRecorder {
  public:
   MemoryRecorder(std::string folder, Recorders recorders)
-      : folder_(std::move(folder)),
-        recorders_(std::move(recorders)),
-        identity_(FileSystem::status(folder_)) {}
+      : folder_(std::move(folder)), recorders_(std::move(recorders)) {}
 
   Status set(ValueTime, const std::string& key, std::int64_t value) override {
     if (Status allowed = checkRights(key); !allowed) return allowed;
@@ -46,17 +42,18 @@ class MemoryRecorder final : public ValueRecorder {
     return Done{};
   }
   Status keep() override {
-    // A fold looks in the folder that has this name now, so it must still be the same one.
-    const auto now = FileSystem::status(folder_);
-    if (!now || !identity_ || now->st_dev != identity_->st_dev ||
-        now->st_ino != identity_->st_ino) {
-      return Error{
-          format("%s was removed: what this program recorded since then is lost: start it again",
-                 folder_)};
+    switch (BHClientGetStatus(nullptr)) {
+      case BHClientStatusRemoved:
+        return Error{format(
+            "this program's file in %s was removed: what it recorded since then is lost: start it "
+            "again",
+            folder_)};
+      case BHClientStatusFull:
+        return Error{
+            format("%s is full: values are dropped until 'tavrelctl stat fold' has run", folder_)};
+      default:
+        return Done{};
     }
-    if (BHClientGetStatus(nullptr) != BHClientStatusFull) return Done{};
-    return Error{
-        format("%s is full: values are dropped until 'tavrelctl stat fold' has run", folder_)};
   }
   bool isInMemory() const override { return true; }
 
@@ -72,7 +69,6 @@ class MemoryRecorder final : public ValueRecorder {
 
   std::string folder_;
   Recorders recorders_;
-  std::optional<struct stat> identity_;
   uid_t user_ = geteuid();
 };
 
@@ -82,15 +78,15 @@ class StoreRecorder final : public ValueRecorder {
 
   Status set(ValueTime time, const std::string& key, std::int64_t value) override {
     if (Status begun = begin(); !begun) return begun;
-    return batch_->setScalar(time.day, key, value);
+    return keptOpen(batch_->setScalar(time.day, key, value));
   }
   Status add(ValueTime time, const std::string& key, std::int64_t amount) override {
     if (Status begun = begin(); !begun) return begun;
-    return batch_->addScalar(time.day, key, amount);
+    return keptOpen(batch_->addScalar(time.day, key, amount));
   }
   Status append(ValueTime time, const std::string& key, double value) override {
     if (Status begun = begin(); !begun) return begun;
-    return batch_->appendValue(time.day, key, time.secondsInDay, value);
+    return keptOpen(batch_->appendValue(time.day, key, time.secondsInDay, value));
   }
   Status keep() override {
     if (!batch_) return Done{};
@@ -107,6 +103,11 @@ class StoreRecorder final : public ValueRecorder {
     if (!batch) return batch.error();
     batch_ = std::move(*batch);
     return Done{};
+  }
+  // A batch that has failed can only be discarded.
+  Status keptOpen(Status changed) {
+    if (!changed) batch_.reset();
+    return changed;
   }
 
   SqliteStore& store_;
@@ -162,12 +163,15 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
   }
 }
 
-ValueTime valueTimeNow() {
-  const auto now = std::chrono::system_clock::now();
-  const auto day = std::chrono::floor<std::chrono::days>(now);
-  const auto seconds = std::chrono::floor<std::chrono::seconds>(now - day);
+ValueTime valueTimeAt(std::chrono::system_clock::time_point time) {
+  const auto day = std::chrono::floor<std::chrono::days>(time);
+  const auto seconds = std::chrono::floor<std::chrono::seconds>(time - day);
   return {static_cast<std::int32_t>(day.time_since_epoch().count()),
           static_cast<std::uint32_t>(seconds.count())};
+}
+
+ValueTime valueTimeNow() {
+  return valueTimeAt(std::chrono::system_clock::now());
 }
 
 std::string keyFault(const std::string& key) {

@@ -7,6 +7,7 @@
 //   if (done) done = (*recorder)->keep();
 #pragma once
 
+#include <chrono>
 #include <cstdint>
 #include <memory>
 #include <string>
@@ -22,18 +23,19 @@ struct ValueTime {
   std::int32_t day;
   std::uint32_t secondsInDay;
 };
+ValueTime valueTimeAt(std::chrono::system_clock::time_point time);
 ValueTime valueTimeNow();
 
 class ValueRecorder {
  public:
   virtual ~ValueRecorder() = default;
   /// These three fail when the user may not record the key, the store cannot be written,
-  /// or a sum exceeds 64 bits.
+  /// or a sum exceeds 64 bits. Then the store keeps nothing that was given since the last `keep`.
   virtual Status set(ValueTime time, const std::string& key, std::int64_t value) = 0;
   virtual Status add(ValueTime time, const std::string& key, std::int64_t amount) = 0;
   virtual Status append(ValueTime time, const std::string& key, double value) = 0;
   /// In the store, commits what was given since the last call in one transaction. In
-  /// memory, where each value is kept at once, fails when the folder was removed or is
+  /// memory, where each value is kept at once, fails when the process's file was removed or is
   /// full, so that values were lost.
   virtual Status keep() = 0;
   virtual bool isInMemory() const = 0;

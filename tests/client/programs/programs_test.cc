@@ -117,6 +117,15 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
   EXPECT_TRUE(outputOf(once + " --state " + root.string(), 1).ends_with("Is a directory\n"));
 }
 
+TEST_F(Programs, TheSamplerEndsWhenItsFileIsRemoved) {
+  EXPECT_EQ(outputOf("exec 2>&1; timeout 60 " + kTool +
+                         "stat collect --every 1 & while kill -0 $! && ! rm " + folder.string() +
+                         "/*.segment; do :; done 2>/dev/null; wait $!",
+                     1),
+            "tavrelctl: this program's file in " + folder.string() +
+                " was removed: what it recorded since then is lost: start it again\n");
+}
+
 TEST_F(Programs, AForkedChildThatExecutesRecordsForItself) {
   run([&] {
     add(1);
