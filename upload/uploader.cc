@@ -110,8 +110,9 @@ Outcome Uploader::run(bool atOnce) {
   }
   if (!*lock) return Outcome::Done;
   Outcome outcome = runLocked(atOnce);
-  // Nothing waits to be sent, so an earlier failure is over.
-  const bool isOver = outcome == Outcome::Done && complaint_.empty() && state_.hasFailure();
+  // Nothing is left to send, so an earlier failure is over. Without a permission, logs may wait.
+  const bool isOver =
+      outcome == Outcome::Done && !lacksPermission_ && complaint_.empty() && state_.hasFailure();
   if (isOver) succeed();
   if (!complaint_.empty()) {
     state_.failure = complaint_;
@@ -138,7 +139,8 @@ Outcome Uploader::runLocked(bool atOnce) {
   if (permitted_.isHeldBack()) {
     complain(format("no log is sent: submission is %s", textOf(permitted_)));
   }
-  if (permitted == Permission::NotGiven) return Outcome::Done;
+  lacksPermission_ = permitted == Permission::NotGiven;
+  if (lacksPermission_) return Outcome::Done;
   if (Status taken = outbox_.takePending([this] { return permission() == Permission::Given; });
       !taken) {
     complain(taken.error().message);
@@ -236,6 +238,14 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
 
   // Packing a large log may have taken seconds.
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
+  if (timeLeft() <= std::chrono::milliseconds(0)) {
+    if (sent_ + refused_ > 0) return stopAtLimit();
+    complain(
+        format("cannot send log %s: a run ends before it is packed: give RunSeconds of more "
+               "than %lld",
+               log.name, std::int64_t{configuration_.run.count()}));
+    return Step::Stop;
+  }
   tried_ = true;
   const auto answer = connection_->put(
       format("%s/%s%s", configuration_.url, log.name, kLogEnding), headers, packed.content,
@@ -254,7 +264,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
 }
 
 Uploader::Step Uploader::stopAtLimit() {
-  services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds",
+  services_.log.log(LogLevel::Default, "logs wait: a run takes at most %lld seconds (RunSeconds)",
                     std::int64_t{configuration_.run.count()});
   return Step::Stop;
 }

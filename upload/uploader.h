@@ -95,6 +95,7 @@ class Uploader {
   std::size_t sent_ = 0;
   std::size_t refused_ = 0;
   std::size_t held_ = 0;  // in the last pass, because the permission does not cover their day
+  bool lacksPermission_ = false;  // from the start; logs may wait
   bool tried_ = false;
   bool failed_ = false;    // a transfer
   std::string complaint_;  // the first of this run

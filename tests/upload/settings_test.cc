@@ -49,12 +49,12 @@ TEST(Upload, HasADeadlineForEverything) {
   device.configuration.run = seconds(1);
   device.log.lines.clear();
   EXPECT_EQ(device.runAgainst(ScriptedServer(slowly), true), Outcome::Waits);
-  EXPECT_EQ(device.log.lines, (Lines{"logs wait: a run takes at most 1 seconds",
+  EXPECT_EQ(device.log.lines, (Lines{"logs wait: a run takes at most 1 seconds (RunSeconds)",
                                      "logs sent: 1, refused by the server: 0"}));
   EXPECT_EQ(device.state().failedTransfers, 0) << "a run that sent something ends at its limit";
   device.configuration.run = seconds(0);
   EXPECT_EQ(device.run(true), Outcome::Waits);
-  EXPECT_EQ(device.log.lines.back(), "logs wait: a run takes at most 0 seconds");
+  EXPECT_EQ(device.log.lines.back(), "logs wait: a run takes at most 0 seconds (RunSeconds)");
   device.configuration.run = seconds(600);
   device.configuration.url = "http://hangs.example/logs";
   device.configuration.connect = seconds(1);

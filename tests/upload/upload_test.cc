@@ -128,6 +128,9 @@ TEST(Upload, KeepsTheLogWhateverIsAnswered) {
     device.clock.time = plist::Date::since1970(0);
     EXPECT_EQ(device.run(), Outcome::Waits);
     EXPECT_GT(server.connections, connections) << "another clock";
+    device.permit("<string>yes</string>");
+    EXPECT_EQ(device.run(), Outcome::Done);
+    EXPECT_TRUE(device.state().nextAttempt) << "logs wait, but may not be sent";
     device.permit("<false/>");
     EXPECT_EQ(device.run(), Outcome::Done);
     EXPECT_FALSE(device.state().hasFailure()) << "nothing waits";
@@ -322,6 +325,33 @@ TEST(Upload, SendsWhatThePermissionIsAskedFor) {
   EXPECT_EQ(device.runAgainst(server, false, files), Outcome::Done);
   EXPECT_EQ(requests, 0) << "the log of a day that is not permitted, which another replaced";
   EXPECT_TRUE(device.log.says("logs of earlier days wait: 1"));
+}
+
+TEST(Upload, MakesNoAttemptWhenPackingTakesTheTimeOfARun) {
+  const std::string cannotSend = "cannot send log " + nameOf(1) +
+                                 ": a run ends before it is packed: give RunSeconds of more than 0";
+  const std::tuple<int, Lines, std::string> cases[] = {
+      {1, {cannotSend}, cannotSend},
+      {2,
+       {"logs wait: a run takes at most 0 seconds (RunSeconds)",
+        "logs sent: 1, refused by the server: 0"},
+       ""}};
+  for (const auto& [number, lines, failure] : cases) {
+    Device device;
+    device.add(nameOf(1));
+    device.add(nameOf(2));
+    WatchedFiles files;
+    files.watched = device.root.path(kOutbox + nameOf(number) + ".metadata.plist");
+    files.reach = [&] { device.configuration.run = std::chrono::seconds(0); };
+    EXPECT_EQ(
+        device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, files),
+        Outcome::Waits);
+    EXPECT_EQ(device.log.lines, lines);
+    const UploadState state = device.state();
+    EXPECT_EQ(std::tuple(state.failure, state.failedTransfers, state.sent),
+              std::tuple(failure, 0, number - 1));
+    EXPECT_EQ(state.lastAttempt.has_value(), number == 2);
+  }
 }
 
 TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
