@@ -17,7 +17,7 @@ struct OutcomeTexts {
 // One row per outcome, in enumeration order. The reasons are worded for past and future runs.
 constexpr OutcomeTexts kTexts[] = {
     {"filed", ""},
-    {"not-permitted", "diagnostic submission not allowed"},
+    {"not-permitted", "submission is not allowed for that day"},
     {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},

@@ -19,7 +19,7 @@ enum class LogOutcome : std::uint8_t {
   NotFiled,  // the system log has the error
 };
 
-/// Why there is no log, such as "diagnostic submission not allowed"; empty for a filed one.
+/// Why there is no log, such as "submission is not allowed for that day"; empty for a filed one.
 std::string_view whyNoLog(LogOutcome outcome);
 /// "a log for day DAY", or "no log for day DAY: " and the reason.
 std::string logOutcomeText(LogOutcome outcome, std::string_view day);

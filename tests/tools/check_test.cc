@@ -64,7 +64,7 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
                       "ago\n"
                       "OK last-log: the next run: no log for day " +
                       std::to_string(today() - 1) + " (" + isoAgo(kDay).substr(0, 10) +
-                      "): diagnostic submission not allowed\n"
+                      "): submission is not allowed for that day\n"
                       "OK store: none yet\n"
                       "OK limits: nothing removed early since yesterday\n"
                       "OK lost-values: none since yesterday\n"
@@ -128,7 +128,7 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   writeRun(kHour, true);
   device.write(kWhitelistFile, "<plist>");
   expect("WARNING last-log: the next run: no log for day " + std::to_string(today() - 1) + " (" +
-             isoAgo(kDay).substr(0, 10) + "): diagnostic submission not allowed; " +
+             isoAgo(kDay).substr(0, 10) + "): submission is not allowed for that day; " +
              device.path(kWhitelistFile) +
              ": XML property list, line 1, column 8: no element found: repair it, or replace it "
              "with another whitelist\n",

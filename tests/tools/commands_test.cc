@@ -290,7 +290,7 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
   const std::string next = "next run: no log for day " + today["day"].dump() + " (" +
                            today["date"].get<std::string>() + "): ";
   const std::pair<std::string, std::string> kCases[] = {
-      {"list", next + "diagnostic submission not allowed"},
+      {"list", next + "submission is not allowed for that day"},
       {"set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool",
        next + "no usable whitelist"},
       {"delete " + dayKey, "last run: none yet"},

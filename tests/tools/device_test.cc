@@ -79,8 +79,11 @@ TEST(Send, NotificationsArePostedAndAwaited) {
   device.check("notify post org.example.n", prints("org.example.n: posted 1 time\n"));
   EXPECT_EQ(device.json("notify post org.example.n"),
             R"({"format_version": 1, "name": "org.example.n", "count": 2})"_json);
-  device.check("notify post a/b", fails("a/b is not the name of a notification: give letters, "
-                                        "digits, '.', '-' and '_', at most 64"));
+  for (const std::string name : {"a/b", ".x"})
+    device.check("notify post " + name,
+                 fails("\"" + name +
+                       "\" is not the name of a notification: give letters, digits, '.', '-' and "
+                       "'_', not beginning with '.', at most 64"));
 }
 
 struct TaskingTest : testing::Test {

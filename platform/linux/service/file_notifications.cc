@@ -34,8 +34,8 @@ FileNotifications::FileNotifications(const DeviceRoot& root, SystemLog& log)
 Expected<std::string> FileNotifications::pathOf(std::string_view name) const {
   if (!isServiceName(name)) {
     return Error{
-        format("%s is not the name of a notification: give letters, digits, '.', '-' and '_', at "
-               "most %zu",
+        format("\"%s\" is not the name of a notification: give letters, digits, '.', '-' and '_', "
+               "not beginning with '.', at most %zu",
                name, limits::kServiceNameBytes)};
   }
   return format("%s/%s", folder_, name);
