@@ -165,6 +165,36 @@ TEST_F(Consent, ShowsWhatIsWithheld) {
   EXPECT_EQ(device.json("log show StorageStatus-1")["log"]["text"], "text");
 }
 
+TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
+  fileLogs({"outbox/log-tallied-1", "outbox/StorageStatus-2", "refused/StorageStatus-3"});
+  fs::permissions(device.path(""), fs::perms{0755});
+  const std::string refused = device.path(kSubmission + "refused");
+  fs::permissions(refused, fs::perms{0700});
+  const auto run = [this](const char* command) {
+    EXPECT_EQ(seteuid(65534), 0);
+    Outcome outcome = device.run(command);
+    EXPECT_EQ(seteuid(0), 0);
+    return outcome;
+  };
+  const std::string unseen = "tavrelctl: cannot list " + refused +
+                             ": Permission denied; run as root or as the owner of the files";
+  const std::tuple<const char*, int, const char*> kCases[] = {
+      {"status", 0, "\nRefused logs     unreadable\n"},
+      {"log list", 1, " outbox  StorageStatus-2.log\n"},
+      {"log show latest", 1, "outbox/log-tallied-1.log is damaged"},
+      {"log show StorageStatus-2", 0, "outbox/StorageStatus-2.log (outbox)\n"},
+      {"nandlog show", 1, "outbox/StorageStatus-2.log"}};
+  for (const auto& [command, status, shown] : kCases) {
+    const Outcome outcome = run(command);
+    EXPECT_EQ(outcome.status, status) << outcome;
+    EXPECT_NE((outcome.out + outcome.error).find(shown), std::string::npos) << outcome;
+    EXPECT_EQ(outcome.error.find(unseen) == 0, std::string_view(command) != "status") << outcome;
+  }
+  fs::remove(device.path(kSubmission + "outbox/log-tallied-1.log"));
+  EXPECT_EQ(run("log show latest"), fails(unseen.substr(11)));
+}
+
 TEST_F(Consent, ErasesWhereverItIsKilled) {
   std::string rows;
   for (int i = 0; i < 1500; ++i) {

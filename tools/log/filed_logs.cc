@@ -39,17 +39,17 @@ bool isRegular(FiledLog& log) {
 }
 
 // The logs of all folders, as their file names describe them. `unseen` receives the reason why
-// withheld ones cannot be seen; when it is null, a note gives the reason.
+// withheld or refused ones cannot be seen; when it is null, a note gives the reason.
 Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
-                                            std::optional<Error>* unseen = nullptr) {
+                                            std::optional<Unseen>* unseen = nullptr) {
   using enum FileSubmission::Place;
   std::vector<FiledLog> logs;
-  std::optional<Error> closed;
+  std::optional<Unseen> closed;
   for (const auto place : {Withheld, Refused, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
-    // Only root may see withheld logs; other users get the rest.
-    if (!found && place == Withheld) {
-      closed = found.error();
+    // Only root may see withheld logs, and on some devices refused ones; other users get the rest.
+    if (!found && (place == Withheld || place == Refused)) {
+      closed = Unseen{found.error(), place};
       continue;
     }
     if (!found) return found.error();
@@ -91,7 +91,7 @@ std::string fileNameOf(const FiledLog& log) {
 }
 
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
-  std::optional<Error> unseen;
+  std::optional<Unseen> unseen;
   auto files = filesOfLogs(context, &unseen);
   if (!files) return files.error();
   FiledLogs filed{*std::move(files), 0, std::move(unseen)};
@@ -124,7 +124,7 @@ Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::st
 
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts,
-                                            std::optional<Error>& unseen) {
+                                            std::optional<Unseen>& unseen) {
   FileSubmission& submission = context.linuxPlatform().submission();
   auto files = filesOfLogs(context, &unseen);
   if (!files) return files.error();

@@ -24,10 +24,15 @@ std::string_view nameOf(FileSubmission::Place place);
 /// The name of its file, with the extension.
 std::string fileNameOf(const FiledLog& log);
 
+/// Why the logs of a folder cannot be seen.
+struct Unseen : Error {
+  FileSubmission::Place place;
+};
+
 struct FiledLogs {
-  std::vector<FiledLog> logs;        // oldest first
-  std::size_t older = 0;             // older logs that were left out
-  std::optional<Error> unseen = {};  // why withheld logs cannot be seen
+  std::vector<FiledLog> logs;         // oldest first
+  std::size_t older = 0;              // older logs that were left out
+  std::optional<Unseen> unseen = {};  // withheld or refused ones
 };
 
 /// The newest logs of all folders, at most `most`, chosen by file name:
@@ -39,10 +44,10 @@ Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::st
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes; nothing when there
 /// is none. The choice goes by file names, so few metadata files are read. `unseen` receives the
-/// reason why withheld logs cannot be seen.
+/// reason why withheld or refused logs cannot be seen.
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts,
-                                            std::optional<Error>& unseen);
+                                            std::optional<Unseen>& unseen);
 
 /// The filed log that `name` identifies: its path, or its file name with or without the extension.
 std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);

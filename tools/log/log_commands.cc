@@ -45,10 +45,15 @@ struct Arguments {
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   std::optional<FiledLog> found;
   if (name == "latest") {
-    std::optional<Error> unseen;  // no daily log is withheld
+    std::optional<Unseen> unseen;
     auto latest = newestLog(
         context, kTalliedLogName, [](const FiledLog&) { return true; }, unseen);
     if (!latest) return latest.error();
+    // No daily log is withheld, but one that was refused may be the latest.
+    if (unseen && unseen->place == FileSubmission::Place::Refused) {
+      if (!*latest) return *unseen;
+      context.fail(unseen->message);
+    }
     if (!*latest) {
       const LogConclusion conclusion = concludeOnLogs(context);
       return Error{format(

@@ -206,7 +206,7 @@ bool isNandLog(const FiledLog& log) {
 }
 
 void show(ToolContext& context) {
-  std::optional<Error> unseen;
+  std::optional<Unseen> unseen;
   const auto found = newestLog(context, kNandLogName, isNandLog, unseen);
   if (!found) return context.fail(found.error().message);
   if (unseen) context.fail(unseen->message);
