@@ -1,14 +1,27 @@
 #include "tools/shared/command_line.h"
 
 #include <CLI/CLI.hpp>
+#include <algorithm>
+#include <utility>
 
 #include "base/format.h"
 
 namespace tavrel {
 namespace {
 
+// Whether another argument could be a value of the command.
+bool takesMore(const CLI::App& command) {
+  return !command
+              .get_options([](const CLI::Option* option) {
+                return option->get_positional() &&
+                       std::cmp_less(option->count(), option->get_items_expected_max());
+              })
+              .empty();
+}
+
 // Describes what is wrong with a command line, and names the subcommand whose help to read.
-std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
+std::string usageFault(const CLI::App& app, const std::vector<std::string>& arguments,
+                       const CLI::ParseError& error) {
   const CLI::App* command = &app;
   std::string line = app.get_name();
   while (!command->get_subcommands().empty()) {
@@ -21,11 +34,13 @@ std::string usageFault(const CLI::App& app, const CLI::ParseError& error) {
   const bool isMissing = dynamic_cast<const CLI::RequiredError*>(&error) != nullptr;
   if ((isExtra || isMissing) && !unknown.empty()) {
     const std::string& first = unknown.front();
-    const bool isGroup = command->get_require_subcommand_min() > 0;
-    if (first.starts_with('-')) {
+    const auto values = std::ranges::find(arguments, "--");
+    const bool isValue = std::find(values, arguments.end(), first) != arguments.end();
+    if (first.starts_with('-') && !isValue) {
       fault = format("no option '%s'", first);
-      if (!isGroup && !first.starts_with("--")) fault += ": put -- before it if it is a value";
-    } else if (isGroup) {
+      if (!first.starts_with("--") && takesMore(*command))
+        fault += ": put -- before it if it is a value";
+    } else if (command->get_require_subcommand_min() > 0) {
       fault = format("no subcommand '%s'", first);
     } else if (isExtra) {
       fault = format("unexpected argument '%s'", first);
@@ -58,7 +73,7 @@ void runCommandLine(CLI::App& app, const std::vector<std::string>& arguments, To
     if (error.get_exit_code() == static_cast<int>(CLI::ExitCodes::Success)) {
       app.exit(error, output.out(), output.error());
     } else {
-      output.failUsage(usageFault(app, error));
+      output.failUsage(usageFault(app, arguments, error));
     }
   }
 }
