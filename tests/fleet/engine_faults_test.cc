@@ -153,8 +153,8 @@ TEST(EngineFaults, LetsOtherUsersQuery) {
   std::filesystem::remove(path + "-shm");
   EXPECT_EQ(failureOfAnother(),
             path +
-                ": attempt to write a readonly database: load a log as its owner, which makes "
-                "the files that readers need, or query a copy");
+                ": attempt to write a readonly database: copy it to a folder that you may write "
+                "in, or load a log into it as its owner");
 }
 
 TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
@@ -177,7 +177,7 @@ TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
   const std::pair<const char*, const char*> passwords[] = {
       {"/long", ": has more than 4096 bytes: name a file that holds only a password"},
       {"/pipe", ": is not a regular file: name another file"},
-      {"/none", ": there is no such file: name the password's"}};
+      {"/none", ": no such file: name the file that holds the password"}};
   for (const auto& [name, failure] : passwords) {
     const std::string path = root.root.path(name);
     EXPECT_EQ(openingFailure("clickhouse://h/d?password-file=" + path), path + failure);

@@ -45,7 +45,7 @@ void checkName(const std::string& what, std::string_view name) {
 
 std::string passwordIn(const std::string& path) {
   auto password = readBeginning(path, kLongestPassword + 1);
-  if (!password) throw EngineError(path + ": there is no such file: name the password's");
+  if (!password) throw EngineError(path + ": no such file: name the file that holds the password");
   if (password->size() > kLongestPassword) {
     throw EngineError(path + ": has more than " + std::to_string(kLongestPassword) +
                       " bytes: name a file that holds only a password");

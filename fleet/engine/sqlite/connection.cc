@@ -12,6 +12,10 @@ namespace {
 
 constexpr int kBusyMilliseconds = 60'000;
 
+// To read, SQLite needs two files beside the database, and makes those that are missing.
+constexpr const char* kCopy =
+    "copy it to a folder that you may write in, or load a log into it as its owner";
+
 const char* adviceFor(int code, bool writes) {
   switch (code & 0xFF) {
     case SQLITE_BUSY:
@@ -24,14 +28,12 @@ const char* adviceFor(int code, bool writes) {
     case SQLITE_FULL:
       return "free some space in its file system";
     case SQLITE_READONLY:
-      return writes ? "check the owner of the file, and of those beside it whose names go on with "
-                      "-wal and -shm"
-                    : "load a log as its owner, which makes the files that readers need, or query "
-                      "a copy";
+      return writes ? "check who owns the file and the two beside it that end in -wal and -shm"
+                    : kCopy;
     case SQLITE_CANTOPEN:
     case SQLITE_PERM:
     case SQLITE_AUTH:
-      return "check owner and permissions of the file and its folder";
+      return writes ? "check owner and permissions of the file and its folder" : kCopy;
     case SQLITE_ERROR:
     case SQLITE_CONSTRAINT:
       return "its tables are not as this program made them; load the logs into a new file";
