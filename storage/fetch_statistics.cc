@@ -32,7 +32,7 @@ bool fetchOver(UserClient& client, const NandExporter& exporter, StandardStreams
   }
   const DeviceBuffer buffer = DeviceBuffer::allocate(size);
   if (!buffer) {
-    streams.printError("Could not valloc %zd bytes", std::int64_t{size});
+    streams.printError("Could not valloc %lld bytes", std::int64_t{size});
     return false;
   }
   if (table) request = SelectorRequest::fetch(*table);

@@ -152,7 +152,7 @@ bool logList(Platform& platform, UserClient& client, const NandExporter& exporte
   if (size == 0) return true;
   const DeviceBuffer buffer = DeviceBuffer::allocate(size);
   if (!buffer) {
-    streams.printError("Could not malloc %zd bytes", std::int64_t{size});
+    streams.printError("Could not malloc %lld bytes", std::int64_t{size});
     return false;
   }
   const auto request = SelectorRequest::fetch(*table, requestFlag, function.subList);

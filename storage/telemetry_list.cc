@@ -133,7 +133,7 @@ bool logTelemetryList(Platform& platform, ByteSpan buffer, const plist::Value& c
 
   const std::vector<Column> columns = columnsOf(controller->generation);
   for (std::int64_t channel = 0; channel < channels; ++channel) {
-    const auto blockAt = static_cast<std::uint64_t>(channel * kBlockBytes);
+    const auto blockAt = static_cast<std::size_t>(channel * kBlockBytes);
     const auto recordAt =
         static_cast<std::uint64_t>(channels * kBlockBytes + channel * kChannelRecordBytes);
     controller->parser(CounterBlock(buffer.subspan(blockAt).first<kBlockBytes>()), *counters);

@@ -107,7 +107,9 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
   Answer answer;
   curl_off_t seconds = 0;
   const char* location = nullptr;
-  curl_easy_getinfo(handle, CURLINFO_RESPONSE_CODE, &answer.status);
+  long status = 0;
+  curl_easy_getinfo(handle, CURLINFO_RESPONSE_CODE, &status);
+  answer.status = static_cast<int>(status);
   if (curl_easy_getinfo(handle, CURLINFO_RETRY_AFTER, &seconds) == CURLE_OK)
     answer.retryAfter = std::clamp<curl_off_t>(seconds, 0, limits::kLongestUploadPauseSeconds);
   if (curl_easy_getinfo(handle, CURLINFO_REDIRECT_URL, &location) == CURLE_OK && location)

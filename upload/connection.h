@@ -20,7 +20,7 @@ inline constexpr const char* kReceivedHeader = "Tavrel-Received";
 
 /// The server's complete answer.
 struct Answer {
-  long status = 0;
+  int status = 0;
   std::string received;         // the header that confirms that a log has arrived; empty without it
   std::string location;         // where a redirect points
   std::int64_t retryAfter = 0;  // seconds; 0 when the server does not say

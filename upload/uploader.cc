@@ -298,12 +298,12 @@ Uploader::Step Uploader::askPermission(std::int64_t day) {
 
 Uploader::Step Uploader::judge(const WaitingLog& log, const Answer& answer,
                                const PackedLog& packed) {
-  const long status = answer.status;
+  const int status = answer.status;
   if (status == 413 || status == 422) return giveUp(log, status);
   const bool isTaken = status == 200 || status == 201 || status == 204;
   if (isTaken && answer.received == packed.digest) return confirm(log, packed);
 
-  std::string why = format("the server answers %ld", status);
+  std::string why = format("the server answers %d", status);
   if (isTaken) {
     why += format(
         " without %s and the log's digest: is this the log server, or a portal of the "
@@ -336,8 +336,8 @@ Uploader::Step Uploader::confirm(const WaitingLog& log, const PackedLog& packed)
   return Step::Next;
 }
 
-Uploader::Step Uploader::giveUp(const WaitingLog& log, long status) {
-  services_.log.log(LogLevel::Error, "the server refuses log %s (%ld): it is kept in %s/refused",
+Uploader::Step Uploader::giveUp(const WaitingLog& log, int status) {
+  services_.log.log(LogLevel::Error, "the server refuses log %s (%d): it is kept in %s/refused",
                     log.name, status, outbox_.folder());
   if (Status moved = outbox_.refuse(log.name, dayOf(services_.clock.now())); !moved)
     return failToMove(moved.error());

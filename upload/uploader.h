@@ -71,7 +71,7 @@ class Uploader {
   Step askPermission(std::int64_t day);
   Step judge(const WaitingLog& log, const Answer& answer, const PackedLog& packed);
   Step confirm(const WaitingLog& log, const PackedLog& packed);
-  Step giveUp(const WaitingLog& log, long status);
+  Step giveUp(const WaitingLog& log, int status);
   Step stopAtLimit();
   Step failToSend(const WaitingLog& log, std::string_view why, std::int64_t serverWish = 0);
   Step failToMove(const Error& error);

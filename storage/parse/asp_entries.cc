@@ -15,7 +15,7 @@ constexpr std::size_t kBlockPairs = 1400;
 }  // namespace
 
 /// Followed in memory by its entries.
-struct ASPEntryArena::Block {
+struct alignas(ASPEntryPair) ASPEntryArena::Block {
   Block* previous;
 };
 

@@ -77,7 +77,7 @@ TEST_F(FoldTest, ASegmentThatBeginsDuringAFoldIsTakenOnce) {
     write(kBHHeaderMagic, {{0}});
     write(kBHHeaderIdentity, {{0, 0}});
     const bool isStopped = runUntilSystemCall(
-        calls, [&] { foldNow(); },
+        static_cast<std::size_t>(calls), [&] { foldNow(); },
         [&] {
           write(kBHHeaderIdentity, {{calls, 1}});
           write(kBHHeaderMagic, {{kBHSegmentMagic}});
@@ -119,7 +119,7 @@ TEST_F(FoldTest, AKilledProgramLosesAndRepeatsNothing) {
     ASSERT_NO_FATAL_FAILURE(expectEachOnce(values.size()));
     const std::int64_t done = progress;
     const std::int64_t last = done > 0 ? scalar("gauge") + 1 : done;
-    for (const std::int64_t left : {std::ssize(values), scalar("count"), last})
+    for (const std::int64_t left : {std::int64_t{std::ssize(values)}, scalar("count"), last})
       ASSERT_TRUE(left == done || left == done + 1) << left << " of " << done;
   }
 }

@@ -114,9 +114,8 @@ TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
   for (std::uint64_t i = 0; i < 8; ++i)
     fields.insert(fields.end(), {kBHCells + 8 * i, kBHChunks + 8 * i, kBHKeyTable + 8 * i});
   for (const std::uint64_t field : fields) {
-    for (const std::uint64_t word :
-         {0UL, 1UL, 0x7fUL, 0xffffUL, 0x7fffffffUL, 0xffffffffUL, std::uint64_t{1} << 62,
-          UINT64_MAX >> 1, std::uint64_t{1} << 63, UINT64_MAX}) {
+    for (const std::uint64_t word : {0ULL, 1ULL, 0x7fULL, 0xffffULL, 0x7fffffffULL, 0xffffffffULL,
+                                     1ULL << 62, ~0ULL >> 1, 1ULL << 63, ~0ULL}) {
       write(field, word);
       readAll();
       boot = std::nullopt;

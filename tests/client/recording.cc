@@ -57,7 +57,7 @@ int __wrap_clock_gettime(clockid_t clock, timespec* now) {
                                : isSteady ? tavrel::testClock().monotonic += 10
                                           : 0;
   if (seconds == 0) return __real_clock_gettime(clock, now);
-  *now = {seconds, isSteady ? seconds * 10'000'000 : 0};
+  *now = {seconds, isSteady ? static_cast<long>(seconds * 10'000'000) : 0};
   return 0;
 }
 }

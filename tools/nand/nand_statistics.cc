@@ -14,7 +14,7 @@
 namespace tavrel {
 namespace {
 
-constexpr std::uint64_t kUnitBytes = 8;
+constexpr std::size_t kUnitBytes = 8;
 constexpr std::uint32_t kLargestValidKey = 0x30000000;
 
 struct Record {

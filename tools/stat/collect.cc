@@ -175,8 +175,8 @@ class EndSignals final : public CollectPace {
     for (;;) {
       const auto left = std::max(end - std::chrono::steady_clock::now(), Ticks::duration::zero());
       const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
-      const timespec wait{.tv_sec = seconds.count(),
-                          .tv_nsec = std::chrono::nanoseconds(left - seconds).count()};
+      const auto rest = std::chrono::nanoseconds(left - seconds).count();
+      const timespec wait{.tv_sec = seconds.count(), .tv_nsec = static_cast<long>(rest)};
       if (sigtimedwait(&signals_, nullptr, &wait) > 0) return true;
       if (errno != EINTR) return false;
     }

@@ -53,7 +53,7 @@ class Sample {
     ++offered_;
     if (chosen_.size() < most_) return chosen_.push_back(std::move(element));
     const std::uint64_t place = random() % offered_;
-    if (place < most_) chosen_[place] = std::move(element);
+    if (place < most_) chosen_[static_cast<std::size_t>(place)] = std::move(element);
   }
   std::vector<Element>& chosen() { return chosen_; }
   std::uint64_t leftOut() const { return offered_ - chosen_.size(); }

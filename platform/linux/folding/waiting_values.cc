@@ -147,8 +147,8 @@ Expected<std::size_t> WaitingValues::readSeries(const Series& series, Series::Pl
   std::size_t count = 0;
   while (count < into.size() && place.block < series.blocks.size()) {
     const Series::Block& block = series.blocks[place.block];
-    const std::span<DistributionSample> part = into.subspan(
-        count, std::min<std::uint64_t>(block.count - place.offset, into.size() - count));
+    const auto most = std::min<std::uint64_t>(block.count - place.offset, into.size() - count);
+    const auto part = into.subspan(count, static_cast<std::size_t>(most));
     const std::uint64_t from = (block.first + place.offset) * sizeof(DistributionSample);
     if (Status done = readAll(copied_.get(), std::as_writable_bytes(part), from); !done) {
       return done.error();

@@ -53,7 +53,9 @@ struct ChannelKey {
 };
 struct ChannelKeyHash {
   // Both IDs are hashes already.
-  std::size_t operator()(const ChannelKey& key) const { return key.driverID ^ key.channelID; }
+  std::size_t operator()(const ChannelKey& key) const {
+    return static_cast<std::size_t>(key.driverID ^ key.channelID);
+  }
 };
 struct ChannelPlace {
   std::uint32_t source;

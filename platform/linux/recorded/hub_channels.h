@@ -47,7 +47,7 @@ class HubChannels {
   struct KeyHash {
     // Keyed, because the author of a recording chooses the IDs.
     std::size_t operator()(const Key& key) const {
-      return keyedHash(asText(std::as_bytes(std::span(&key, 1))));
+      return static_cast<std::size_t>(keyedHash(asText(std::as_bytes(std::span(&key, 1)))));
     }
   };
 

@@ -69,15 +69,15 @@ void SegmentFile::readKeys(std::uint32_t number) {
   read(kBHKeyTable + std::uint64_t{first} * std::uint64_t{kBHKeyEntryBytes}, entries);
   // A name is written before its entry, so it is complete once the entry has been read.
   std::array<std::byte, 8192> names;
-  std::uint64_t namesStart = 0;
-  std::uint64_t namesEnd = 0;
+  std::size_t namesStart = 0;
+  std::size_t namesEnd = 0;
   for (std::uint32_t i = 0; i < kAtOnce; ++i) {
     std::uint8_t& keptKind = kinds_[first + i + 1];
     std::string& name = names_[first + i + 1];
     if (keptKind != kUnread) continue;
     const std::uint64_t entry =
         *loadNative64(entries, std::size_t{i} * std::size_t{kBHKeyEntryBytes});
-    const std::uint64_t offset = entry & 0xffffffff;
+    const std::size_t offset = entry & 0xffffffff;
     const std::size_t length = (entry >> 32) & 0xffff;
     if (length == 0 || length > kBHLongestName || offset > kBHNamesBytes ||
         length > kBHNamesBytes - offset) {

@@ -13,9 +13,9 @@ namespace {
 // segment's end is only the version `kEndVersion`.
 constexpr std::uint32_t kVersion = 2;
 constexpr std::uint32_t kEndVersion = 3;
-constexpr std::uint64_t kHeadBytes = 24;
-constexpr std::uint64_t kCellBytes = 20;
-constexpr std::uint64_t kChunkBytes = 12;
+constexpr std::size_t kHeadBytes = 24;
+constexpr std::size_t kCellBytes = 20;
+constexpr std::size_t kChunkBytes = 12;
 
 template <class Word>
 void append(std::string& out, Word word) {

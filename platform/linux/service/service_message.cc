@@ -43,16 +43,17 @@ Expected<plist::Dictionary> readMessageFile(int file) {
                         std::uint64_t{limits::kMessageFileBytes})};
   }
   // Read, not mapped: a file of huge pages cannot be unmapped with its plain length.
-  const auto content = std::make_unique_for_overwrite<std::byte[]>(size);
-  std::uint64_t length = 0;
-  while (length < size) {
+  const auto bytes = static_cast<std::size_t>(size);
+  const auto content = std::make_unique_for_overwrite<std::byte[]>(bytes);
+  std::size_t length = 0;
+  while (length < bytes) {
     const ssize_t count =
-        pread(file, content.get() + length, size - length, static_cast<off_t>(length));
+        pread(file, content.get() + length, bytes - length, static_cast<off_t>(length));
     if (count < 0 && errno == EINTR) continue;
     if (count <= 0) return systemFailure("cannot read the memory file");
-    length += static_cast<std::uint64_t>(count);
+    length += static_cast<std::size_t>(count);
   }
-  return decodeMessage(ByteSpan(content.get(), size));
+  return decodeMessage(ByteSpan(content.get(), bytes));
 }
 
 /// The descriptors that came with a packet.

@@ -23,7 +23,7 @@ constexpr std::size_t kSampleBytes = kPackedValueBytes + kPackedOffsetBytes;
 
 std::size_t PendingDistributions::HashName::operator()(const Name& name) const {
   // The odd factor keeps the days of one key apart.
-  return keyedHash(name.key) +
+  return static_cast<std::size_t>(keyedHash(name.key)) +
          static_cast<std::size_t>(static_cast<std::uint32_t>(name.day)) * 0x9E3779B1U;
 }
 
