@@ -12,7 +12,8 @@ namespace {
 /// All choices of so many components are tried. Of more, some are joined first.
 constexpr std::size_t kMostComponents = 12;
 
-/// Disjoint sets of groups.
+/// Disjoint sets of groups. The smallest group of a set stands for it, in whatever order they were
+/// united: cells are in the order of loading, and answers must not depend on it.
 class Components {
  public:
   explicit Components(std::size_t groups) : parent_(groups) {
@@ -26,7 +27,10 @@ class Components {
     }
     return static_cast<std::uint32_t>(group);
   }
-  void unite(std::size_t a, std::size_t b) { parent_[of(a)] = of(b); }
+  void unite(std::size_t a, std::size_t b) {
+    const auto [smaller, larger] = std::minmax({of(a), of(b)});
+    parent_[larger] = smaller;
+  }
 
  private:
   std::vector<std::uint32_t> parent_;

@@ -1,4 +1,5 @@
 // Questions about whole fleets: what the answers contain, and what they must not reveal.
+#include <algorithm>
 #include <cmath>
 #include <gmock/gmock.h>
 #include <map>
@@ -251,6 +252,31 @@ TEST(PrivacyTest, NothingSmallFollowsFromTwoDivisions) {
     expectNothingSmallFollowsFromTwo(divisions, fresh);
   }
   EXPECT_GT(groups, 1000u);
+}
+
+TEST(PrivacyTest, JoinsTheSameGroupsInWhateverOrderTheLogsWereLoaded) {
+  const struct {
+    const char* region;
+    const char* version;
+    unsigned devices;
+  } groups[] = {{"r03", "o03", 3},  {"r04", "o04", 11}, {"r04", "o12", 8}, {"r04", "o13", 1},
+                {"r05", "o05", 12}, {"r05", "o13", 7},  {"r06", "o06", 5}, {"r06", "o14", 7},
+                {"r07", "o03", 2},  {"r07", "o07", 5},  {"r07", "o12", 1}, {"r07", "o14", 2},
+                {"r07", "o15", 10}};
+  std::vector<std::pair<const char*, const char*>> logs;
+  for (const auto& [region, version, devices] : groups)
+    logs.insert(logs.end(), devices, {version, region});
+  std::minstd_rand random(1);
+  for (int turn = 0; turn < 10; ++turn) {
+    TestFleet fleet;
+    for (const auto& [version, region] : logs)
+      fleet.add(1, version, region);
+    const LogTable table(fleet.engine());
+    Ledger ledger(table, 5);
+    EXPECT_THAT(titles(summarise(fleet.engine(), ledger, {}).parts[1].groups),
+                ElementsAre("r04 20/20", "(other) 54/54"));
+    std::shuffle(logs.begin(), logs.end(), random);
+  }
 }
 
 TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
