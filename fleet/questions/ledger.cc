@@ -1,6 +1,7 @@
 #include "fleet/questions/ledger.h"
 
 #include <algorithm>
+#include <span>
 #include <utility>
 
 #include "fleet/questions/crossing.h"
@@ -13,50 +14,66 @@ bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   if (found == shown_.end()) return true;
   const Sets& sets = found->second;
   const Sets& rests = rests_.at(subject);
+  // Most sets that include the logs include much more, so this ends after a few words.
+  const auto leavesFew = [&](const LogSet& all) {
+    if (!all.includes(logs)) return !isNoneOrEnough(all.without(logs));
+    return all != logs && !all.differsByAtLeast(logs, devicesAtLeast_, table_);
+  };
   LogSet rest = logs;
   for (std::size_t i = 0; i < sets.size(); ++i) {
     const LogSet& other = *sets[i];
-    if (logs == other) continue;
+    if (logs == other || logs.isApartFrom(other)) continue;
     if (!logs.differsByAtLeast(other, devicesAtLeast_, table_)) return false;
-    if (other.includes(logs) && !isNoneOrEnough(rests[i]->without(logs))) return false;
+    if (other.includes(logs) && leavesFew(*rests[i])) return false;
     if (!rest.empty() && logs.includes(other)) rest = rest.without(other);
   }
   return isNoneOrEnough(rest);
 }
 
-std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, const LogSet& logs) {
-  std::shared_ptr<const LogSet> kept;
+std::shared_ptr<const LogSet> Ledger::keep(const LogSet& logs) {
   const std::size_t hash = logs.hash();
   const auto [first, last] = known_.equal_range(hash);
-  for (auto known = first; known != last && !kept; ++known) {
-    if (*known->second == logs) kept = known->second;
-  }
-  if (!kept) {
-    kept = std::make_shared<const LogSet>(logs);
-    known_.emplace(hash, kept);
-  }
+  for (auto known = first; known != last; ++known)
+    if (*known->second == logs) return known->second;
+  return known_.emplace(hash, std::make_shared<const LogSet>(logs))->second;
+}
+
+std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, const LogSet& logs) {
+  return noteDisjoint(subject, {&logs}).front();
+}
+
+Ledger::Sets Ledger::noteDisjoint(const std::string& subject,
+                                  const std::vector<const LogSet*>& disjoint) {
   Sets& sets = shown_[subject];
   Sets& rests = rests_[subject];
-  if (std::find(sets.begin(), sets.end(), kept) != sets.end()) return kept;
-  std::shared_ptr<const LogSet> rest = kept;
   const auto take = [](std::shared_ptr<const LogSet>& from, const LogSet& part) {
-    if (!from->empty()) from = std::make_shared<const LogSet>(from->without(part));
+    if (!from->empty() && !part.empty()) from = std::make_shared<const LogSet>(from->without(part));
   };
-  for (std::size_t i = 0; i < sets.size(); ++i) {
-    if (sets[i]->includes(logs)) take(rests[i], logs);
-    if (logs.includes(*sets[i])) take(rest, *sets[i]);
+  // None of the new sets includes another, so each is compared with the earlier ones only.
+  const std::size_t earlier = sets.size();
+  Sets result;
+  for (const LogSet* logs : disjoint) {
+    const std::shared_ptr<const LogSet> kept = result.emplace_back(keep(*logs));
+    if (std::ranges::count(std::span(sets).first(earlier), kept) != 0) continue;
+    std::shared_ptr<const LogSet> rest = kept;
+    for (std::size_t i = 0; i < earlier; ++i)
+      if (kept->includes(*sets[i])) take(rest, *sets[i]);
+    sets.push_back(kept);
+    rests.push_back(std::move(rest));
   }
-  sets.push_back(kept);
-  rests.push_back(std::move(rest));
-  return kept;
+  for (std::size_t i = 0; i < earlier; ++i) {
+    LogSet parts;
+    for (std::size_t part = earlier; part < sets.size(); ++part)
+      if (sets[i]->includes(*sets[part])) parts.add(*sets[part]);
+    take(rests[i], parts);
+  }
+  return result;
 }
 
 void Ledger::noteDivision(const std::string& subject, const LogSet& whole,
                           const std::vector<const LogSet*>& parts) {
-  Parts noted{noteShown(subject, whole), {}};
-  for (const LogSet* part : parts)
-    noted.parts.push_back(noteShown(subject, *part));
-  divisions_[subject].push_back(std::move(noted));
+  auto kept = noteShown(subject, whole);
+  divisions_[subject].push_back({std::move(kept), noteDisjoint(subject, parts)});
 }
 
 std::vector<Ledger::Sets> Ledger::divisionsOf(const std::string& subject,

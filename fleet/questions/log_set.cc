@@ -88,6 +88,11 @@ bool LogSet::includes(const LogSet& other) const {
   });
 }
 
+bool LogSet::isApartFrom(const LogSet& other) const {
+  return empty() || other.empty() || words_.back().position < other.words_.front().position ||
+         other.words_.back().position < words_.front().position;
+}
+
 std::size_t LogSet::logs() const {
   std::size_t count = 0;
   for (const Word& word : words_)

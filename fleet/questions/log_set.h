@@ -30,6 +30,8 @@ class LogSet {
   bool empty() const { return words_.empty(); }
   void add(const LogSet& other);
   bool includes(const LogSet& other) const;
+  /// Whether the sets share no log, as far as their first and last logs tell.
+  bool isApartFrom(const LogSet& other) const;
 
   bool operator==(const LogSet&) const = default;
 
