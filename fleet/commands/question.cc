@@ -55,14 +55,14 @@ Question::Question(FleetContext& context, const QuestionOptions& options)
   }
   if (!options.days.empty()) {
     try {
-      days_ = readDays(options.days);
+      days_ = readDays(options.days).value_or(DayRange{});
     } catch (const UsageError& error) {
       throw UsageError("--days: " + std::string(error.what()));
     }
   }
 }
 
-DayRange Question::readDays(std::string_view text) const {
+std::optional<DayRange> Question::readDays(std::string_view text) const {
   // One device with a wrong clock must not decide which days are the newest.
   std::optional<std::int32_t> newest;
   for (const LogTable::Day& day : table_.days()) {
@@ -70,9 +70,7 @@ DayRange Question::readDays(std::string_view text) const {
   }
   const auto days = parseDayRange(text, newest.value_or(0));
   if (!days) throw UsageError(days.error().message);
-  // Without such a day nothing can be shown, not even the day of a log.
-  if (!newest && parseNumber<std::uint32_t>(text))
-    throw std::runtime_error(tooFewText(ledger_.devicesAtLeast()));
+  if (!newest && parseNumber<std::uint32_t>(text)) return std::nullopt;
   return *days;
 }
 

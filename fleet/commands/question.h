@@ -44,9 +44,9 @@ class Question {
   Ledger& ledger() { return ledger_; }
   const DayRange& days() const { return days_; }
 
-  /// A number of days ends with the newest day that has enough devices. Throws UsageError, and
-  /// std::runtime_error with a readable line when there is no such day.
-  DayRange readDays(std::string_view text) const;
+  /// A number of days ends with the newest day that has enough devices. Without such a day returns
+  /// nothing: then nothing can be shown, not even the day of a log. Throws UsageError.
+  std::optional<DayRange> readDays(std::string_view text) const;
   /// Those of enough devices, by number.
   const std::vector<std::string>& versions() const { return versions_; }
   /// The one of these that the text names, either in full or by a part that no other one contains.

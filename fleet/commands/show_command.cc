@@ -27,10 +27,12 @@ GroupBy groupBy(const std::string& name) {
 }
 
 /// Tries a whole version first, then a range of days, then a part of a version.
-void readAgainst(const Question& question, const std::string& text, ShowRequest& request) {
+void readAgainst(Question& question, const std::string& text, ShowRequest& request) {
   if (std::ranges::find(question.versions(), text) == question.versions().end()) {
     try {
       request.againstDays = question.readDays(text);
+      if (!request.againstDays)
+        throw std::runtime_error(tooFewText(question.ledger().devicesAtLeast()));
     } catch (const UsageError&) {
       // Then it must be part of a version.
     }

@@ -318,17 +318,25 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
     EXPECT_EQ(output.status, status);
     EXPECT_EQ(output.out, "");
   }
-  EXPECT_EQ(run(file, {"summary", "--devices-at-least", "41"}).out,
-            "All logs: fewer than 41 devices: nothing is shown\n");
   for (std::vector<std::string> arguments :
-       {std::vector<std::string>{"summary", "--json", "--days", "7"},
-        {"show", "=sum", "--against", "7"}}) {
+       std::vector<std::vector<std::string>>{{"summary", "--json"},
+                                             {"page", "-o", "-"},
+                                             {"show", "=sum"},
+                                             {"compare", "4.9", "4.10"}}) {
+    SCOPED_TRACE(arguments[0]);
     arguments.insert(arguments.end(), {"--devices-at-least", "41"});
-    const Output output = run(file, arguments);
-    EXPECT_EQ(output.error, "tavrel-fleet: fewer than 41 devices: nothing is shown\n");
-    EXPECT_EQ(output.out, "");
-    EXPECT_EQ(output.status, 1);
+    const Output all = run(file, arguments);
+    arguments.insert(arguments.end(), {"--days", "7"});
+    const Output some = run(file, arguments);
+    EXPECT_EQ(some.out, all.out);
+    EXPECT_EQ(some.error, all.error);
+    EXPECT_EQ(some.status, all.status);
   }
+  EXPECT_EQ(run(file, {"summary", "--days", "7", "--devices-at-least", "41"}).out,
+            "All logs: fewer than 41 devices: nothing is shown\n");
+  const Output against = run(file, {"show", "=sum", "--against", "7", "--devices-at-least", "41"});
+  EXPECT_EQ(against.error, "tavrel-fleet: fewer than 41 devices: nothing is shown\n");
+  EXPECT_EQ(against.status, 1);
   for (const auto& [where, message] :
        {std::pair("http://h/d",
                   "no database has an address that begins with \"http://\": write "
