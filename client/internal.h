@@ -44,17 +44,19 @@ void bhDrop(struct Process* process, struct Segment* segment);
 
 /* segment_file.c */
 
-/* What the name of a segment's file is made of. */
+/* What the name of a segment's file is made of, and where it is. */
 struct SegmentName {
   uint64_t time; /* CLOCK_MONOTONIC, nanoseconds */
   uint64_t thread;
+  uint64_t root; /* tells the process's root folder from another one */
 };
 
 /* Creates and maps a new segment and fills in its header; NULL with `status` on failure. */
 struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
                                BHClientStatus* status);
 void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segment* segment);
-/* Whether the segment's file, or its folder, has been removed. */
+/* Whether the segment's file, or its folder, has been removed. Not known, and false, in a process
+ * that has changed its root folder. */
 bool bhWasRemoved(const char* folder, struct SegmentName name);
 /* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);

@@ -90,7 +90,8 @@ struct Lane {
  * no call has to check whether it runs in a child. */
 struct State {
   _Atomic(struct Segment*) segment;
-  _Atomic uint64_t nameTime; /* the two parts of its file's name; 0 until they are known */
+  _Atomic uint64_t nameTime; /* the parts of its file's name; 0 until they are known */
+  _Atomic uint64_t nameRoot;
   _Atomic uint64_t nameThread;
   _Atomic uint64_t retryAt; /* no segment is begun before these CLOCK_MONOTONIC seconds */
   _Atomic int status;       /* why there is none */

@@ -41,6 +41,7 @@ static struct Segment* begin(struct Process* process, uint64_t now) {
                                               memory_order_acquire)) {
     atomic_store(&process->mapped, begun);
     atomic_store_explicit(&state->nameTime, name.time, memory_order_relaxed);
+    atomic_store_explicit(&state->nameRoot, name.root, memory_order_relaxed);
     atomic_store_explicit(&state->nameThread, name.thread, memory_order_release);
     return begun;
   }
@@ -119,9 +120,11 @@ static const char* textOf(BHClientStatus status) {
 /* Threads keep pointers into the segment, so that no other can take its place. */
 static bool isRemoved(const struct Process* process) {
   struct State* state = process->state;
-  const uint64_t thread = atomic_load_explicit(&state->nameThread, memory_order_acquire);
-  const uint64_t time = atomic_load_explicit(&state->nameTime, memory_order_relaxed);
-  return thread != 0 && bhWasRemoved(process->folder, (struct SegmentName){time, thread});
+  struct SegmentName name;
+  name.thread = atomic_load_explicit(&state->nameThread, memory_order_acquire);
+  name.time = atomic_load_explicit(&state->nameTime, memory_order_relaxed);
+  name.root = atomic_load_explicit(&state->nameRoot, memory_order_relaxed);
+  return name.thread != 0 && bhWasRemoved(process->folder, name);
 }
 
 static BHClientStatus currentStatus(void) {

@@ -51,12 +51,19 @@ static char* appendHex(char* to, uint64_t number) {
   return to;
 }
 
+static uint64_t rootFolder(void) {
+  struct stat root = {0};
+  (void)stat("/", &root);
+  return (uint64_t)root.st_dev << 32 ^ (uint64_t)root.st_ino;
+}
+
 static struct SegmentName makeName(unsigned attempt) {
   struct timespec now = {0};
   clock_gettime(CLOCK_MONOTONIC, &now);
   return (struct SegmentName){
       (uint64_t)now.tv_sec * 1000000000U + (uint64_t)now.tv_nsec + attempt,
       (uint64_t)syscall(SYS_gettid),
+      rootFolder(),
   };
 }
 
@@ -192,6 +199,7 @@ void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segmen
 }
 
 bool bhWasRemoved(const char* folder, struct SegmentName name) {
+  if (rootFolder() != name.root) return false;
   const int directory = openFolder(folder);
   if (directory < 0) return errno == ENOENT;
   char file[64];

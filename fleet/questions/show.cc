@@ -76,6 +76,7 @@ class SideAnswer {
       parts[part].logs.forEach([&](LogIndex log) { partOf_[log] = part; });
     }
     std::vector<ShownSet> sets;
+    sets.reserve(parts.size());
     for (const Group& part : parts)
       sets.push_back(setOf(part.name, part.logs));
     side.whole = setOf({PartKind::kWhole}, division.whole);

@@ -325,7 +325,7 @@ TEST_F(Recording, OnAnOldKernelTheWholeFileIsAllocatedAtOnce) {
 
 TEST_F(Recording, SaysWhenItsFileIsGone) {
   for (const auto& removed : {folder / "*", std::filesystem::path(root)}) {
-    run([=, this] {
+    run([=] {
       record(1);
       EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
       outputOf("rm -r " + removed.string(), 0);
@@ -337,6 +337,18 @@ TEST_F(Recording, SaysWhenItsFileIsGone) {
       run([] { EXPECT_NE(BHClientGetStatus(nullptr), BHClientStatusRemoved); });
     });
   }
+}
+
+TEST_F(Recording, AProcessThatChangesItsRootFolderGoesOn) {
+  if (geteuid() != 0) GTEST_SKIP() << "not root";
+  run([this] {
+    record(1);
+    ASSERT_EQ(chroot(root.c_str()), 0);
+    record(2);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
+  });
+  fold();
+  EXPECT_EQ(records["series"], (std::vector<double>{1, 2}));
 }
 
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {

@@ -26,7 +26,12 @@ struct Service : ProcessServices {
         submission(root, services(fileSystem)) {
     store.today = kToday;
   }
-  explicit Service(const DeviceRoot& root) : Service(root, files) {}
+  explicit Service(const DeviceRoot& root)
+      : ProcessServices(root),
+        version(root, files, coding, log),
+        submission(root, services(files)) {
+    store.today = kToday;
+  }
 
   FileSubmission::Services services(FileSystem& fileSystem) {
     return {fileSystem, coding, preferences, preferences, days, version, clock, log};

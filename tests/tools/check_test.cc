@@ -30,7 +30,7 @@ std::string logName(double seconds) {
 }
 
 struct CheckTest : testing::Test {
-  const TemporaryDevice device;
+  const TemporaryDevice device{};
 
   /// Expects the line of one check, without the times in its text.
   void expect(const std::string& line, int status) const {

@@ -24,22 +24,21 @@ Descriptor reopen(const Descriptor& found) {
 
 }  // namespace
 
-LineReader::LineReader(const std::string& path, std::uint64_t largest) : left_(largest) {
+LineReader::LineReader(const std::string& path, std::uint64_t largest)
+    : left_(largest), errorNumber_(begin(path, largest)) {}
+
+int LineReader::begin(const std::string& path, std::uint64_t largest) {
   // The path may be a user's link to a device, and opening some devices has an effect: a watchdog
   // starts. So look first, and open only what was found.
   const Descriptor found(open(path.c_str(), O_PATH | O_CLOEXEC));
   struct stat status {};
-  if (!found || fstat(found.get(), &status) != 0) {
-    errorNumber_ = errno;
-  } else if (!S_ISREG(status.st_mode)) {
-    errorNumber_ = EINVAL;
-  } else if (static_cast<std::uint64_t>(status.st_size) > largest) {
-    errorNumber_ = EFBIG;
-  } else if (descriptor_ = reopen(found); !descriptor_) {
-    errorNumber_ = errno;
-  } else {
-    buffer_ = std::make_unique_for_overwrite<char[]>(limits::kTextLineBytes);
-  }
+  if (!found || fstat(found.get(), &status) != 0) return errno;
+  if (!S_ISREG(status.st_mode)) return EINVAL;
+  if (static_cast<std::uint64_t>(status.st_size) > largest) return EFBIG;
+  descriptor_ = reopen(found);
+  if (!descriptor_) return errno;
+  buffer_ = std::make_unique_for_overwrite<char[]>(limits::kTextLineBytes);
+  return 0;
 }
 
 std::optional<std::string_view> LineReader::next() {

@@ -30,15 +30,16 @@ class LineReader {
   int errorNumber() const { return errorNumber_; }
 
  private:
+  int begin(const std::string& path, std::uint64_t largest);
   bool fill();
 
   Descriptor descriptor_;
-  int errorNumber_ = 0;
   std::uint64_t left_;  // bytes that may still be read if the file grows
   std::unique_ptr<char[]> buffer_;
   std::size_t begin_ = 0;
   std::size_t end_ = 0;
   bool insideCutLine_ = false;
+  int errorNumber_;
 };
 
 }  // namespace tavrel
