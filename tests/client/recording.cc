@@ -11,14 +11,17 @@ constexpr std::size_t kLargePage = 16'384;
 }
 
 extern "C" {
-int __real_clock_gettime(clockid_t clock, timespec* now);
-int __wrap_clock_gettime(clockid_t clock, timespec* now);
+// Where time_t and off_t are wider than long, the C library's calls have other names.
+int realClock(clockid_t clock, timespec* now) __asm__("__real_" TAVREL_CLOCK_CALL);
+int wrappedClock(clockid_t clock, timespec* now) __asm__("__wrap_" TAVREL_CLOCK_CALL);
+void* realMap(void* from, std::size_t bytes, int access, int flags, int file,
+              off_t offset) __asm__("__real_" TAVREL_MAP_CALL);
+void* wrappedMap(void* from, std::size_t bytes, int access, int flags, int file,
+                 off_t offset) __asm__("__wrap_" TAVREL_MAP_CALL);
 int __real_madvise(void* from, std::size_t bytes, int advice);
 int __wrap_madvise(void* from, std::size_t bytes, int advice);
 long __real_sysconf(int name);
 long __wrap_sysconf(int name);
-void* __real_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset);
-void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset);
 
 int __wrap_madvise(void* from, std::size_t bytes, int advice) {
   if (tavrel::whileFetching) tavrel::whileFetching();
@@ -35,17 +38,17 @@ long __wrap_sysconf(int name) {
   return name == _SC_PAGESIZE && tavrel::largePages ? long{kLargePage} : __real_sysconf(name);
 }
 
-void* __wrap_mmap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset) {
+void* wrappedMap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset) {
   if (tavrel::largePages && from == nullptr) {
     void* const room =
-        __real_mmap(nullptr, bytes + kLargePage, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+        realMap(nullptr, bytes + kLargePage, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
     from = static_cast<char*>(room) + -reinterpret_cast<std::uintptr_t>(room) % kLargePage;
     flags |= MAP_FIXED;
   }
-  return __real_mmap(from, bytes, access, flags, file, offset);
+  return realMap(from, bytes, access, flags, file, offset);
 }
 
-int __wrap_clock_gettime(clockid_t clock, timespec* now) {
+int wrappedClock(clockid_t clock, timespec* now) {
   const bool isReal = clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE;
   if (auto* const whenRead = tavrel::testClock().whenRead.load(); isReal && whenRead) whenRead();
   const bool isBoot = clock == CLOCK_BOOTTIME;
@@ -56,7 +59,7 @@ int __wrap_clock_gettime(clockid_t clock, timespec* now) {
                                : isBoot   ? tavrel::testClock().boot.load()
                                : isSteady ? tavrel::testClock().monotonic += 10
                                           : 0;
-  if (seconds == 0) return __real_clock_gettime(clock, now);
+  if (seconds == 0) return realClock(clock, now);
   *now = {seconds, isSteady ? static_cast<long>(seconds * 10'000'000) : 0};
   return 0;
 }
