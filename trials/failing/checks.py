@@ -205,7 +205,7 @@ def after_collect(device, reference, done):
     now, right = collected(device), wanted(collected, reference)
     before = wanted(collected, done.before)
     # They are how the machine is asked.
-    is_whole = done.kind not in ("allocation", "open", "read", "listing")
+    is_whole = done.kind not in ("allocation", "open", "read", "listing", "thread")
     wrong = {key: value for key, value in now.items() if value not in (right[key], before.get(key))}
     if wrong or done.returncode == 0 and (
             now["samples"] != right["samples"] or is_whole and now != right):

@@ -5,6 +5,7 @@
 #include <condition_variable>
 #include <fcntl.h>
 #include <mutex>
+#include <new>
 #include <system_error>
 #include <thread>
 #include <utility>
@@ -17,7 +18,7 @@ namespace {
 
 constexpr std::size_t kAttributeBytes = 4096;
 
-std::optional<std::string> readSlowly(SlowFile& file) {
+std::optional<std::string> readAll(SlowFile& file) {
   if (!file.descriptor) {
     file.descriptor = Descriptor(open(file.path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
   }
@@ -28,6 +29,13 @@ std::optional<std::string> readSlowly(SlowFile& file) {
   if (count < 0) return std::nullopt;
   text.resize(static_cast<std::size_t>(count));
   return text;
+}
+
+// An exception that leaves a thread would end the process.
+std::optional<std::string> readSlowly(SlowFile& file) try {
+  return readAll(file);
+} catch (const std::bad_alloc&) {
+  return std::nullopt;
 }
 
 }  // namespace
