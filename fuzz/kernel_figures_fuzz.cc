@@ -30,7 +30,8 @@ void collect(fuzz::Tree& tree, fuzz::Input& input, unsigned first) {
   tree.write("/sys/block/sda/device/x", "");
   for (unsigned i = 0; i < 3 && !input.empty(); ++i)
     tree.write(kFiles[(first + i) % std::size(kFiles)], input.part());
-  MachineSources sources(tree.root);
+  fuzz::SilentLog log;
+  MachineSources sources(tree.root, log);
   const MachineReading reading = sources.read(Processes::Counted);
   // The second reading uses the files that the first has left open.
   const MachineReading again = sources.read(Processes::LeftOut);
