@@ -128,7 +128,7 @@ for folder in $folders; do mkdir "$folder/Library"; done
 for folder in $folders; do cat /dev/zero >"$folder/full" 2>/dev/null; done
 expect "units with full folders" "collect: exit-code 1
   tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
-'tavrelctl stat fold'
+'tavrelctl stat fold' or free space in /run
 fold: success 0
 daily: exit-code 0
   this run will not be remembered: cannot write /var/lib/tavrel/last-run.plist: No space left on \
@@ -152,7 +152,7 @@ metrics: exit-code 1
 tavrel: active success 0
 tavrel-sampler: activating exit-code 1
   tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
-'tavrelctl stat fold'
+'tavrelctl stat fold' or free space in /run
 tavrel-statsd: active success 0" \
   "$(outcomes)"
 # shellcheck disable=SC2086
