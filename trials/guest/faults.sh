@@ -1,6 +1,6 @@
-# Runs every unit with its folders missing, on a read-only system, and with folders that are
-# read-only, owned by others, or full. A unit that cannot work must fail with a status and a
-# message; none may be killed by a signal or hang.
+# Runs every unit with its folders missing, on a read-only system, without room in /tmp, and with
+# folders that are read-only, owned by others, or full. A unit that cannot work must fail with a
+# status and a message; none may be killed by a signal or hang.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 kept="/var/mobile /var/lib/tavrel"
 folders="$kept /run/tavrel"
@@ -76,15 +76,37 @@ for folder in $folders; do rm -rf "$folder" && mv "$folder.kept" "$folder"; done
 
 # Keep writable what a read-only system needs. Meanwhile the journal keeps its files in /run.
 journalctl --relinquish-var
-cover mode=755 /var /tmp
+cover mode=755 /var
 mount -o remount,bind,ro /
 expect "the system is read-only" 1 "$(touch /etc/tavrel/file 2>/dev/null; echo $?)"
 expect "units on a read-only system with an empty /var" "$all_work" "$(outcomes)"
 expect "the folders that they made" "755 root root /var/lib/tavrel
 755 root root /var/mobile" "$(stat -c '%a %U %G %n' /var/lib/tavrel /var/mobile)"
 mount -o remount,bind,rw /
-uncover /var /tmp
+uncover /var
 journalctl --flush
+
+# Any user can bring this about.
+cover nr_inodes=1 /tmp
+expect "no folder can be made in /tmp" 1 "$(mkdir /tmp/folder 2>/dev/null; echo $?)"
+expect "units without room in /tmp" "$all_work" "$(outcomes)"
+uncover /tmp
+
+# A request stays as long as no fold can be confined.
+mkdir -p /run/systemd/system/tavrel-fold.service.d
+printf '[Service]\nBindReadOnlyPaths=/missing\n' >/run/systemd/system/tavrel-fold.service.d/fault.conf
+systemctl daemon-reload
+touch /run/tavrel/stat/fold-wanted
+systemctl start tavrel-fold.path
+sleep 10
+expect "the path unit goes on" active "$(systemctl is-active tavrel-fold.path)"
+systemctl stop tavrel-fold.path
+settle
+journalctl --quiet --sync
+most "folds that could not be confined, in ten seconds" 11 "$(journalctl --quiet -o cat \
+  -u tavrel-fold.service | grep -c 'Failed at step NAMESPACE')"
+rm -r /run/systemd/system/tavrel-fold.service.d
+systemctl daemon-reload
 
 # shellcheck disable=SC2086
 cover ro $kept

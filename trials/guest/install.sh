@@ -12,9 +12,11 @@ for timer in daily fold upload; do
   printf '[Timer]\nRandomizedDelaySec=0\nAccuracySec=1s\n' \
     >"/run/systemd/system/tavrel-$timer.timer.d/exact.conf"
 done
-# Also prevent a run that is due because of the time since the start.
-printf 'OnBootSec=\nOnCalendar=*-*-* 00:05:00 UTC\n' \
-  >>/run/systemd/system/tavrel-daily.timer.d/exact.conf
+# The test sets the clock, so nothing may become due because of the time since the start.
+printf 'OnBootSec=\nOnCalendar=hourly\n' >>/run/systemd/system/tavrel-fold.timer.d/exact.conf
+mkdir -p /run/systemd/system/tavrel-daily-boot.timer.d
+printf '[Timer]\nOnBootSec=\nOnBootSec=1y\n' \
+  >/run/systemd/system/tavrel-daily-boot.timer.d/never.conf
 systemctl daemon-reload
 systemd-run --quiet --unit=keeps-slice --slice=tavrel.slice sleep infinity
 find / -xdev | sort >/root/before
@@ -26,7 +28,8 @@ apt-get install -qq -y --no-install-recommends "$packages"/tavrel_*.deb \
   "$packages"/python3-brimhold_*.deb >/root/apt.log 2>&1
 expect "packages are installed" 0 "$?"
 settle
-units="tavrel-daily.timer
+units="tavrel-daily-boot.timer
+tavrel-daily.timer
 tavrel-fold-shutdown.service
 tavrel-fold.path
 tavrel-fold.timer

@@ -1,7 +1,17 @@
 # Removal and purge.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 nginx -s quit 2>/dev/null
-apt-get remove -qq -y '*tavrel*' '*brimhold*' >/root/apt.log 2>&1
+mkdir -p "$submission/outbox"
+: >"$submission/outbox/log-tallied-20371125T000000Z-00000000.log"
+systemctl restart tavrel-upload.service
+settle
+expect "an upload waits for its next attempt" activating \
+  "$(systemctl is-active tavrel-upload.service)"
+apt-get remove -qq -y tavrel-upload >/root/apt.log 2>&1
+expect "the package that sends is removed" 0 "$?"
+expect "nothing sends any more" inactive "$(systemctl is-active tavrel-upload.service)"
+: >/var/mobile/Library/Preferences/.tavrel-0123abcd.tmp
+apt-get remove -qq -y '*tavrel*' '*brimhold*' >>/root/apt.log 2>&1
 expect "the packages are removed" 0 "$?"
 expect "their units are gone" "" "$(systemctl list-units --no-legend --plain 'tavrel*' |
   grep -v '\.slice')"
