@@ -134,6 +134,7 @@ Outcome Uploader::run(bool atOnce) {
 
 Outcome Uploader::runLocked(bool atOnce) {
   state_ = readUploadState(services_.files, services_.propertyLists, services_.log, statePath_);
+  outbox_.openFolders();
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted_.isHeldBack()) {
@@ -238,7 +239,8 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
 
   // Packing a large log may have taken seconds.
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;
-  if (timeLeft() <= std::chrono::milliseconds(0)) {
+  const std::chrono::milliseconds left = timeLeft();
+  if (left <= std::chrono::milliseconds(0)) {
     if (sent_ + refused_ > 0) return stopAtLimit();
     complain(
         format("cannot send log %s: a run ends before it is packed: give RunSeconds of more "
@@ -249,7 +251,7 @@ Uploader::Step Uploader::send(const WaitingLog& log) {
   tried_ = true;
   const auto answer = connection_->put(
       format("%s/%s%s", configuration_.url, log.name, kLogEnding), headers, packed.content,
-      std::min<std::chrono::milliseconds>(configuration_.transfer, timeLeft()),
+      std::min<std::chrono::milliseconds>(configuration_.transfer, left),
       [&] { return askPermission(day) == Step::Next; });
   if (answer) return judge(log, *answer, packed);
   if (const Step asked = askPermission(day); asked != Step::Next) return asked;

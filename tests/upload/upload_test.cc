@@ -233,8 +233,9 @@ TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {
   obstructed.permit("<false/>");
   obstructed.write(kSubmission + "pending", "");
   obstructed.add(nameOf(1));
+  obstructed.write(kOutbox + nameOf(2) + ".log/file", "in a folder, which is no log");
   EXPECT_EQ(obstructed.run(), Outcome::Failed);
-  EXPECT_EQ(obstructed.names(), Lines{});
+  EXPECT_EQ(obstructed.names(), Lines{nameOf(2) + ".log"});
   EXPECT_EQ(
       obstructed.log.lines,
       (Lines{"cannot list " + obstructed.root.path(kSubmission + "pending") + ": Not a directory",
@@ -367,6 +368,22 @@ TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
   EXPECT_TRUE(device.log.lines[0].starts_with(line + "; next attempt after 2026-11-27T18:"));
   EXPECT_EQ(device.state().failure, line);
   EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().sent), std::tuple(1, 0));
+}
+
+TEST(Upload, OpensTheFoldersThatEarlierVersionsClosed) {
+  const std::tuple<std::string, unsigned, unsigned> cases[] = {{"outbox", 0700, 0755},
+                                                               {"refused", 0700, 0755},
+                                                               {"outbox", 0750, 0750},
+                                                               {"pending", 0700, 0700}};
+  for (const auto& [name, before, after] : cases) {
+    Device device;
+    device.permit("");
+    device.add(nameOf(1), name + "/");
+    const std::string folder = device.root.path(kSubmission + name);
+    fs::permissions(folder, fs::perms{before});
+    EXPECT_EQ(device.run(), Outcome::Done);
+    EXPECT_EQ(fs::status(folder).permissions(), fs::perms{after}) << name;
+  }
 }
 
 TEST(Upload, LosesNoLogThatChangesMeanwhile) {

@@ -86,8 +86,9 @@ struct RemovedLogs {
 };
 
 /// Deletes all logs in these folders of `submission`, leftover metadata and files still being
-/// written. Links are deleted, not their targets. Each log goes before its metadata. When a log
-/// cannot be deleted, the others still are; the first failure is reported.
+/// written. Links are deleted, not their targets; a folder named like a log is none, and stays.
+/// Each log goes before its metadata. When a log cannot be deleted, the others still are; the first
+/// failure is reported.
 RemovedLogs removeLogsIn(FileSystem& files, const std::string& submission,
                          std::initializer_list<std::string_view> folders);
 
