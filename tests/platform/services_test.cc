@@ -193,12 +193,13 @@ TEST_F(ServicesTest, SystemLogSpeaksToTheJournalWhenTheStreamIsItsOwn) {
   setenv("JOURNAL_STREAM", name.c_str(), 1);
   LinuxSystemLog systemLog(stream.get(), path);
   LinuxSystemLog without(stream.get(), path + ".none");
-  systemLog.write(LogLevel::Info, "one\ntwo");
+  systemLog.write(LogLevel::Info, "one\n\033two");
   without.write(LogLevel::Error, "one\ntwo");
   unsetenv("JOURNAL_STREAM");
   const std::string packet = received();
   EXPECT_EQ(packet.substr(0, 29), "PRIORITY=6\nSYSLOG_IDENTIFIER=");
-  EXPECT_TRUE(packet.ends_with(std::string("\nMESSAGE\n\7\0\0\0\0\0\0\0one\ntwo\n", 25))) << packet;
+  EXPECT_TRUE(packet.ends_with(std::string("\nMESSAGE\n\13\0\0\0\0\0\0\0one\n\\x1Btwo\n", 29)))
+      << packet;
 
   // An entry too large for a datagram arrives as a file, without bytes of its own.
   systemLog.write(LogLevel::Debug, std::string(16U << 20, 'x'));

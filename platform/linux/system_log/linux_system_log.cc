@@ -82,6 +82,17 @@ void appendPrintable(std::string& out, std::string_view text) {
   }
 }
 
+/// Adds the lines of a message, each printable, with `between` in place of the line ends.
+void appendLines(std::string& out, std::string_view message, std::string_view between) {
+  while (true) {
+    const std::size_t end = message.find('\n');
+    appendPrintable(out, message.substr(0, end));
+    if (end == std::string_view::npos) return;
+    out += between;
+    message.remove_prefix(end + 1);
+  }
+}
+
 /// The last offset up to `at` that does not split a character; `at` when the text is not UTF-8.
 std::size_t characterBoundary(std::string_view text, std::size_t at) {
   constexpr std::size_t kContinuationBytes = 3;
@@ -180,7 +191,9 @@ bool LinuxSystemLog::sendToJournal(LogLevel level, std::string_view message) {
   entry += "\nSYSLOG_IDENTIFIER=";
   entry += program_invocation_short_name;
   entry += '\n';
-  appendField(entry, "MESSAGE", message);
+  std::string lines;
+  appendLines(lines, message, "\n");
+  appendField(entry, "MESSAGE", lines);
   while (send(journal_.get(), entry.data(), entry.size(), MSG_NOSIGNAL) < 0) {
     if (errno == EINTR) continue;
     if (errno == EMSGSIZE || errno == ENOBUFS) return sendInMemoryFile(journal_.get(), entry);
@@ -207,13 +220,7 @@ void LinuxSystemLog::writeToStream(LogLevel level, std::string_view message) con
     line += names.word;
     line += ' ';
   }
-  while (true) {
-    const std::size_t end = message.find('\n');
-    appendPrintable(line, message.substr(0, end));
-    if (end == std::string_view::npos) break;
-    line += continuation;
-    message.remove_prefix(end + 1);
-  }
+  appendLines(line, message, continuation);
   line += '\n';
   writeBytes(errorStream_, line);
 }

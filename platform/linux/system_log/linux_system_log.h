@@ -3,8 +3,8 @@
 // Under the service manager standard error is connected to the journal, and JOURNAL_STREAM
 // identifies that stream. Entries then go to the journal's own socket, so that an entry of several
 // lines stays one entry and is not mixed with what is printed on standard error. Otherwise each
-// entry is written on standard error at once, as "TIME LEVEL message", further lines indented and
-// control characters escaped.
+// entry is written on standard error at once, as "TIME LEVEL message", further lines indented.
+// Control characters other than line ends are escaped.
 //
 // A message above debug level that is longer than `kLongestMessage` is cut there, with a note of
 // how much is missing, and follows whole at debug level.
