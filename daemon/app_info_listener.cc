@@ -15,8 +15,12 @@ void deliver(Platform& platform, const plist::Array& appData) {
   platform.log->log(LogLevel::Default, "tavrel got %sAAI:\n%@",
                     requested ? "requested" : "(unsolicited -- so ignoring) ", appInfo);
   if (!requested) return;
-  runDailyIfNeeded(platform, appInfo);
-  requested = false;
+  requested = false;  // even if the run throws: the list has arrived
+  if (!runDailyIfNeeded(platform, appInfo)) {
+    platform.log->write(LogLevel::Info,
+                        "dropped the list: the daily run had already taken place; deliver it "
+                        "before tavrel-daily.timer starts the run");
+  }
 }
 
 void announce(Platform& platform) {

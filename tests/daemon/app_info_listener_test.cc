@@ -93,6 +93,18 @@ TEST_F(ListenerTest, RunsTheDayWithTheInformationDelivered) {
             (Messages{kAnnounced, "tavrel got requestedAAI:\n" + kList, "daily tasks for day 19999",
                       "tavrel got (unsolicited -- so ignoring) AAI:\n" + kList}));
   EXPECT_EQ(std::ranges::count(fake.journal, "post com.norvane.tallied.tavrel.logging"), 1);
+  EXPECT_EQ(
+      serve({kAnnounce, kDeliver}),
+      (Messages{kAnnounced, "tavrel got requestedAAI:\n" + kList, "Day unchanged since last run",
+                "dropped the list: the daily run had already taken place; deliver it before "
+                "tavrel-daily.timer starts the run"}));
+}
+
+TEST_F(ListenerTest, DoesNotMissAListWhoseRunFailed) {
+  fake.preferences.keyWithoutMemory = "LastLogOutcome";
+  EXPECT_EQ(serve({kAnnounce, kDeliver}),
+            (Messages{kAnnounced, "tavrel got requestedAAI:\n" + kList, "daily tasks for day 19999",
+                      "cannot go on serving: std::bad_alloc"}));
 }
 
 TEST_F(ListenerTest, RunsTheDayWithAnEmptyListOrNone) {
