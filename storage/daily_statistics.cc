@@ -8,6 +8,7 @@
 #include "base/bytes.h"
 #include "base/format.h"
 #include "ioreport/ioreport.h"
+#include "platform/guarded.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info_keys.h"
 #include "storage/structured_log.h"
@@ -126,17 +127,27 @@ void reportChannels(Platform& platform) {
   });
 }
 
+struct StorageStep {
+  const char* name;
+  const char* purpose;  // completes "cannot ..." when an exception ends the step
+  void (*run)(Platform& platform);
+};
+
+constexpr StorageStep kSteps[] = {
+    {"Disk space", "report the disk space", reportDiskUsage},
+    {"Structured storage log and NAND information", "finish the storage log and NAND information",
+     reportNANDInfoScalars},
+    {"ECC events", "finish filing ECC events", reportECCEvents},
+    {"Report channels", "finish reading report channels", reportChannels},
+};
+
 }  // namespace
 
 void dailyStorageStatistics(Platform& platform, const StepObserver& onStep) {
-  beginStep(onStep, "Disk space");
-  reportDiskUsage(platform);
-  beginStep(onStep, "Structured storage log and NAND information");
-  reportNANDInfoScalars(platform);
-  beginStep(onStep, "ECC events");
-  reportECCEvents(platform);
-  beginStep(onStep, "Report channels");
-  reportChannels(platform);
+  for (const StorageStep& step : kSteps) {
+    beginStep(onStep, step.name);
+    runGuarded(platform.log, step.purpose, [&] { step.run(platform); });
+  }
 }
 
 }  // namespace tavrel

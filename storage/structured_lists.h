@@ -1,8 +1,8 @@
 // Logs the storage driver's lists. All their fields are little-endian.
 //
 // A callback takes a list's buffer and the controller's characteristics, and returns whether the
-// list could be logged. Diagnostics go to standard error. Reading texts and making small
-// dictionaries cannot fail, so these steps have no diagnostics.
+// list could be logged. Diagnostics go to standard error. When memory runs out, a callback throws
+// `std::bad_alloc`, which ends this list only.
 #pragma once
 
 #include "base/bytes.h"

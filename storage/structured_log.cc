@@ -6,6 +6,7 @@
 #include <optional>
 #include <span>
 
+#include "platform/guarded.h"
 #include "storage/device_buffer.h"
 #include "storage/driver_client.h"
 #include "storage/fetch_statistics.h"
@@ -181,8 +182,13 @@ bool logStorageLists(Platform& platform, DriverService& service, const NandExpor
     bool isLogged = true;
     std::int32_t index = 0;
     for (const SelectorFunction& function : functions.all()) {
-      isLogged &=
-          logList(platform, client, exporter, function, index++, requestFlag, characteristics);
+      bool isThisLogged = false;
+      runGuarded(platform.log, "log a list of the storage driver", [&] {
+        isThisLogged =
+            logList(platform, client, exporter, function, index, requestFlag, characteristics);
+      });
+      isLogged &= isThisLogged;
+      ++index;
     }
     return isLogged;
   });

@@ -219,6 +219,7 @@ TEST_F(DailyRunTest, GoesOnBehindAnException) {
     }
   } failing;
   fake.drivers.behind = &failing;
+  fake.controls.eccEvents.emplace_back(72);
   fake.eventLoop.events = {[this] {
     fake.state.appInfoRequested = true;
     throw std::runtime_error("the message");
@@ -227,8 +228,10 @@ TEST_F(DailyRunTest, GoesOnBehindAnException) {
   EXPECT_EQ(fake.log.messages(),
             (Messages{"tavrel started", "cannot go on serving: the message", kNeverCame,
                       "daily tasks for day 19999", kNotPermitted,
-                      "cannot finish the storage statistics: std::bad_alloc", "tavrel ended"}));
+                      "cannot finish the storage log and NAND information: std::bad_alloc",
+                      "tavrel ended"}));
   EXPECT_EQ(fake.journal, kGatedTasks);
+  EXPECT_EQ(fake.crashReporting.records.size(), 1U);
 }
 
 TEST_F(DailyRunTest, EndsWithoutAFurtherRunWhenTheSystemSaysSo) {

@@ -161,6 +161,28 @@ TEST(StructuredLogTest, SaysWhatFails) {
   EXPECT_EQ(platform.crashReporting.records[0].second, (Dictionary{{"Factory Count", 9}}));
 }
 
+TEST(StructuredLogTest, GoesOnWithTheNextListWhenMemoryRunsOut) {
+  struct Reporting : FakeCrashReporting {
+    using FakeCrashReporting::FakeCrashReporting;
+    void FLLogStructuredData(std::uint32_t type, const Dictionary& record) override {
+      if (record.contains("RD")) throw std::bad_alloc();
+      FakeCrashReporting::FLLogStructuredData(type, record);
+    }
+  };
+  Driver driver;
+  driver.answer(kTelemetry, Bytes(4128));
+  driver.answer(kDefects, words({0, 9, 0}));
+  StoragePlatform platform(driver.services(
+      Dictionary{{"chip-id", "K3V"}, {"manufacturer-id", "AD825223215F"}, {"num-bus", 1}}));
+  Reporting reporting(platform.journal);
+  platform.platform.crashReporting = reporting;
+  EXPECT_FALSE(DumpStorageStructuredLog(platform.platform, false));
+  EXPECT_EQ(platform.log.messages(),
+            Journal{"cannot log a list of the storage driver: std::bad_alloc"});
+  ASSERT_EQ(reporting.records.size(), 1U);
+  EXPECT_EQ(reporting.records[0].second, (Dictionary{{"Factory Count", 9}}));
+}
+
 TEST(StructuredLogTest, RefusesTelemetryThatItCannotPlace) {
   const Dictionary good{{"chip-id", "K3V"}, {"manufacturer-id", "AD825223215F"}, {"num-bus", 1}};
   const auto with = [&](const char* key, const Value& value) {
