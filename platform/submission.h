@@ -18,6 +18,8 @@ class LogFile {
   virtual void write(ByteSpan bytes) = 0;
 };
 
+inline constexpr std::string_view kUnknownOSVersion = "unknown";
+
 /// The type of the daily log, the only one that holds rows of the statistics store.
 inline constexpr std::string_view kTalliedLogType = "193";
 
@@ -43,7 +45,7 @@ class SubmissionService {
                                         const plist::Dictionary& options,
                                         const LogWriter& writer) = 0;
 
-  /// "name version (build)".
+  /// "name version (build)", or `kUnknownOSVersion`.
   virtual std::string ZTXOSVersion() = 0;
 
   /// A value that remote tasking sets; null when absent.

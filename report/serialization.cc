@@ -90,8 +90,9 @@ plist::Dictionary BHReport::submissionOptions() {
 void BHReport::noteOSVersion(plist::Dictionary& options) {
   Preferences& preferences = platform_.preferences;
   const plist::Value stored = preferences.ZTXPreferencesGetValue(kLastOSVersionKey, kTavrelDomain);
-  const plist::Value current = platform_.submission->ZTXOSVersion();
-  if (current == stored) return;
+  const std::string current = platform_.submission->ZTXOSVersion();
+  // A version that is unknown for one run would look like two updates.
+  if (current == kUnknownOSVersion || plist::Value(current) == stored) return;
   preferences.ZTXPreferencesSetValue(kLastOSVersionKey, current, kTavrelDomain);
   preferences.ZTXPreferencesSynchronize(kTavrelDomain);
   options.set("previous_os_version", stored.string().value_or("<unknown>"));

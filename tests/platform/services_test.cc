@@ -78,6 +78,12 @@ TEST_F(ServicesTest, SystemVersionIsReadOrMadeFromOsRelease) {
     if (list) device.write("/etc/tavrel/system-version.plist", list);
     EXPECT_EQ(device.version.text(), text);
   }
+  // Neither the other file nor the kernel's release stands in for a file that cannot be read.
+  Services device;
+  device.write("/usr/lib/os-release", "VERSION_ID=1\n");
+  std::filesystem::create_directories(device.root.path("/etc/os-release"));
+  EXPECT_EQ(device.version.text(), "unknown");
+  EXPECT_EQ(device.log.lines.size(), 1U);
 }
 
 TEST_F(ServicesTest, CrashReportingKeepsRecordsPerTypeOfThirtyOneDays) {

@@ -147,9 +147,13 @@ TEST_F(BHReportTest, TellsAboutAChangedOSVersionOnce) {
   write();
   EXPECT_FALSE(fake.submission.logs[1].options);
 
+  fake.submission.osVersion = "unknown";  // for one run, which is no change
+  write();
+  EXPECT_FALSE(fake.submission.logs[2].options);
+
   fake.submission.osVersion = "Pellio 7.2 (21B1)";
   write();
-  EXPECT_EQ(fake.submission.logs[2].options,
+  EXPECT_EQ(fake.submission.logs[3].options,
             (Dictionary{{"previous_os_version", "Pellio 7.1 (21A5)"}}));
 }
 

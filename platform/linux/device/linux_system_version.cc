@@ -6,6 +6,7 @@
 #include "base/limits.h"
 #include "platform/linux/files/line_reader.h"
 #include "platform/linux/files/property_list_file.h"
+#include "platform/submission.h"
 
 namespace tavrel {
 namespace {
@@ -71,14 +72,14 @@ std::string LinuxSystemVersion::text() {
     text += *build;
     text += ')';
   }
-  return text.empty() ? "unknown" : text;
+  return text.empty() ? std::string(kUnknownOSVersion) : text;
 }
 
 const plist::Dictionary& LinuxSystemVersion::known() {
   if (known_) return known_;
   const std::string path = root_.path(kVersionFile);
-  // A file that exists but cannot be read leaves the version unknown: the one in os-release would
-  // look like an update of the OS.
+  // A file that exists but cannot be read leaves the version unknown: another source, or none,
+  // would look like an update of the OS.
   const auto content = files_.readIfPresent(path, limits::kPropertyListBytes);
   const bool isMissing = content && !*content;
   known_ = isMissing ? fromOsRelease()
@@ -94,7 +95,9 @@ plist::Dictionary LinuxSystemVersion::fromOsRelease() {
       auto content = files_.readIfPresent(path, limits::kSystemFactBytes);
       if (!content) {
         log_.write(LogLevel::Error, content.error().message);
-      } else if (*content) {
+        return plist::Dictionary::create();
+      }
+      if (*content) {
         text = *std::move(*content);
         break;
       }

@@ -21,7 +21,7 @@ class LinuxSystemVersion final : public SystemVersion {
 
   plist::Dictionary systemVersionDictionary() override;
 
-  /// "name version (build)" without unknown parts; "unknown" when all are.
+  /// "name version (build)" without unknown parts; `kUnknownOSVersion` when all are.
   std::string text();
 
  private:
