@@ -1,10 +1,13 @@
+#include <chrono>
 #include <csignal>
 #include <cstddef>
 #include <cstdio>
+#include <cstdlib>
 #include <exception>
 #include <fcntl.h>
 #include <span>
 #include <string_view>
+#include <thread>
 #include <unistd.h>
 #include <utility>
 
@@ -42,33 +45,52 @@ std::string_view taskOf(int argc, char** argv) {
   return mode.empty() ? "service" : "daily";
 }
 
-}  // namespace
+/// How long a service that cannot work waits before it ends, as in tavrel.service after a failed
+/// start.
+constexpr std::chrono::seconds kPauseOfService{30};
 
-// The exit status is always 0: a failed run must not be restarted; there is another run the next
-// day.
-int main(int argc, char** argv) {
+/// Clients still wait for the socket that the service manager passed: it starts the next process as
+/// soon as this one ends.
+void pauseIfActivated() {
+  if (std::getenv("LISTEN_FDS") != nullptr) std::this_thread::sleep_for(kPauseOfService);
+}
+
+/// False when the run could not begin or was cut short.
+bool run(int argc, char** argv) {
   using namespace tavrel;
-  secureStandardStreams();
   try {
     DeviceRoot root = DeviceRoot::fromEnvironment();
     if (const Status usable = root.check(); !usable) {
       LinuxSystemLog().write(LogLevel::Error, usable.error().message);
-      return 0;
+      return false;
     }
     LinuxSystemLog systemLog;
     LinuxClock clock;
     RunMemory memory(root, clock, systemLog, taskOf(argc, argv));
+    bool isWhole = false;
     try {
       // Inside the try block, because its destructor writes the run's changes, which may fail too.
       LinuxPlatform linuxPlatform(std::move(root), {.log = &memory});
       runTavrel(linuxPlatform.platform(),
                 std::span<const char* const>(argv, static_cast<std::size_t>(argc)));
+      isWhole = true;
     } catch (const std::exception& error) {
       memory.log(LogLevel::Error, "run ended early: %s", error.what());
     }
     memory.finish();
+    return isWhole;
   } catch (const std::exception& error) {
     tellEnd(error);
+    return false;
   }
+}
+
+}  // namespace
+
+// The exit status is always 0: a failed run must not be restarted; there is another run the next
+// day.
+int main(int argc, char** argv) {
+  secureStandardStreams();
+  if (!run(argc, argv)) pauseIfActivated();
   return 0;
 }
