@@ -303,6 +303,7 @@ TEST(LiveTest, RecordsWhatIsLive) {
 
   // Ids depend neither on the machine nor on the boot.
   other.write("/proc/uptime", "8.00 1.00\n");
+  other.write(kZone + "thermal_zone1/temp", "9\n");  // it had no value when it was recorded
   EXPECT_EQ(other.run("report sample").out, live.out);
   EXPECT_EQ(device.run("registry list").out, other.run("registry list").out);
   device.check("registry record --seconds 1 -",

@@ -88,6 +88,12 @@ class ReportHubClient final : public UserClient {
   }
 
  private:
+  // False for a recorded service that replaces a live one, although their ids may be equal.
+  bool isLive(std::uint64_t driver) const {
+    const RecordedEntry* const service = recording_->serviceWithID(driver);
+    return service && service->isLive;
+  }
+
   KernelReturn failFor(const Error& error) {
     log_.write(LogLevel::Error, error.message);
     return kKernelNoMemory;
@@ -107,7 +113,12 @@ class ReportHubClient final : public UserClient {
       const std::uint64_t driver = *loadLittle64(interests, at);
       const std::uint64_t id = *loadLittle64(interests, at + 8);
       const HubChannel* const channel = recording_->hubChannels().find(driver, id);
-      const std::size_t size = channel ? channel->largestGroup() : live ? live->add(driver, id) : 0;
+      std::size_t size = 0;
+      if (channel) {
+        size = channel->largestGroup();
+      } else if (live && isLive(driver)) {
+        size = live->add(driver, id);
+      }
       if (size == 0) continue;
       bytes += size;
       if (bytes > limits::kDeviceAllocationBytes) return kKernelNoMemory;
