@@ -231,11 +231,12 @@ template <class Walk>
 IterateResult runWalk(const Walk& walk, const plist::Dictionary& aggregate,
                       const plist::Dictionary& other, plist::Dictionary* newAggregate) {
   using Walker = Engine<Walk>;
-  if (Walker::kBuilds && !newAggregate) return kIterateFailed;
   plist::Dictionary built;
   try {
     const IterateResult result = Walker(walk).walkLevel(aggregate, other, built, 0);
-    if (Walker::kBuilds && !walkFailed(result)) *newAggregate = built;
+    if (!Walker::kBuilds || walkFailed(result)) return result;
+    if (!newAggregate) return kIterateFailed;
+    *newAggregate = built;
     return result;
   } catch (const std::bad_alloc&) {
     return kIterateFailed;

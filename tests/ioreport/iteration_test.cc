@@ -78,7 +78,14 @@ TEST(IterationTest, FailsForMalformedAggregates) {
     EXPECT_EQ(IOReportPrune(aggregate, kKeep), 273);
   }
   endless.remove("IOReportDrivers");
-  EXPECT_EQ(iterateAggregate(letters("a"), {}, CloneWalk{kKeep}, nullptr), 273);
+  // A clone that nobody takes fails at its end.
+  int calls = 0;
+  const CloneCallback count = [&](const Dictionary&, Dictionary&) {
+    ++calls;
+    return kIterateContinue;
+  };
+  EXPECT_EQ(iterateAggregate(letters("ab"), {}, CloneWalk{count}, nullptr), 273);
+  EXPECT_EQ(calls, 2);
   EXPECT_EQ(IOReportIterate(letters("a"), nullptr), 273);
   // Entries that are not levels are skipped when there are others.
   EXPECT_EQ(IOReportGetChannelCount(drivers(Dictionary{{"a", 5}, {"b", letters("b")}})), 1);
