@@ -120,7 +120,8 @@ EventLoop::Slice LinuxEventLoop::runSlice(std::chrono::milliseconds longest) {
       break;
     }
     if (ready != 1) continue;
-    const auto found = callbacks_.find(event.data.u64);
+    const std::uint64_t source = event.data.u64;  // a copy: the member may not be aligned
+    const auto found = callbacks_.find(source);
     if (found == callbacks_.end()) continue;
     // Shared, because the callback may end its own source.
     const std::shared_ptr<Callback> callback = found->second;
