@@ -201,9 +201,17 @@ TEST(CheckReadOnly, IsOfTheFileSystemNotOfTheMount) {
   constexpr const char* kMounts =
       "31 1 8:2 / / ro,relatime shared:1 - ext4 /dev/sda2 rw,errors=remount-ro\n"
       "32 31 8:3 / /var rw,relatime - ext4 /dev/sda3 ro,errors=remount-ro\n"
-      "33 31 0:9 / /run rw - tmpfs ro ro\n";
-  for (const auto& [mount, isReadOnly] :
-       {std::pair(31U, false), {32U, true}, {33U, true}, {3U, false}})
+      "33 31 0:9 / /run rw - tmpfs ro ro\n"
+      "34 31 8:4 / /home rw,relatime - ext4 /dev/sda4 rw,errors=remount-ro,emergency_ro\n"
+      "35 31 8:5 / /srv rw - ext4 /dev/sda5 rw,emergency_ro,errors=remount-ro\n"
+      "36 31 0:10 / /opt ro,emergency_ro - x ro rw,ro_x,x_ro";
+  for (const auto& [mount, isReadOnly] : {std::pair(31U, false),
+                                          {32U, true},
+                                          {33U, true},
+                                          {34U, true},
+                                          {35U, true},
+                                          {36U, false},
+                                          {3U, false}})
     EXPECT_EQ(isReadOnlyIn(kMounts, mount), isReadOnly) << mount;
 }
 
