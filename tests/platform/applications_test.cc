@@ -90,6 +90,20 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
                   root.path(path + "/d") + "; move them up"});
 }
 
+TEST_F(ApplicationsTest, SaysWhatCannotBeListed) {
+  writeEntry("/usr/share/applications/tool.desktop", "Type=Application");
+  const std::string homes = root.path("/home");
+  const std::string own = root.path("/usr/local/share/applications");
+  std::filesystem::create_directories(root.path("/usr/local/share"));
+  for (const std::string& folder : {homes, own})
+    std::filesystem::create_symlink(folder, folder);
+  EXPECT_EQ(bundles(), Lines{"tool.desktop System"});
+  const std::string reason =
+      ": Too many levels of symbolic links; not all applications are counted";
+  EXPECT_EQ(log.lines, (Lines{"cannot list the homes in " + homes + reason,
+                              "cannot list the desktop entries in " + own + reason}));
+}
+
 TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   EXPECT_EQ(bundles(), Lines{});
   EXPECT_EQ(log.lines, Lines{});
@@ -118,6 +132,9 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   ASSERT_NE(signal(SIGIO, SIG_IGN), SIG_ERR);
   if (fcntl(held.get(), F_SETLEASE, F_WRLCK) != 0) GTEST_SKIP() << "no leases here";
   EXPECT_EQ(bundles(), Lines{}) << "waiting ends the lease after 45 seconds";
+  EXPECT_EQ(log.lines.back(), "cannot read " + tool +
+                                  ": Resource temporarily unavailable; not all applications are "
+                                  "counted");
 }
 
 }  // namespace

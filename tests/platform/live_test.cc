@@ -67,6 +67,23 @@ TEST(LiveMachineTest, ASensorThatBlocksHidesNoOther) {
   Descriptor(open(path.c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
 }
 
+TEST(LiveMachineTest, SaysWhatCannotBeListed) {
+  DeviceServices device;
+  device.write("/proc/uptime", "5\n");
+  device.write("/sys/class/thermal/x", "");
+  const std::string zones = device.root.path("/sys/class/thermal");
+  const std::string records = device.root.path("/sys/fs/pstore");
+  std::filesystem::remove_all(zones);
+  std::filesystem::create_directories(device.root.path("/sys/fs"));
+  for (const std::string& folder : {zones, records})
+    std::filesystem::create_symlink(folder, folder);
+  LiveMachine live(device.root, device.log);
+  EXPECT_EQ(Subscribed(live).update(), "boot.seconds=5 ");
+  const std::string line =
+      "cannot list " + zones + ": Too many levels of symbolic links; not everything in it is shown";
+  EXPECT_EQ(device.log.lines, (Lines{line, line})) << "cooling devices and zones";
+}
+
 TEST(LiveMachineTest, FilesStayOpen) {
   DeviceServices device;
   const std::string path = kZone + "0/temp";

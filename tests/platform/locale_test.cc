@@ -98,6 +98,14 @@ TEST_F(LocaleTest, ListsTheLanguagesOfTheSystem) {
   write("/usr/lib/locale/fr_FR.utf8/LC_TIME", "");
   EXPECT_EQ(locale.systemLanguages(), (Names{"en", "de-DE", "fr-FR", "zh-TW"}));
 
+  const std::string folder = root.path("/usr/lib/locale");
+  std::filesystem::remove_all(folder);
+  std::filesystem::create_symlink(folder, folder);
+  for (int i = 0; i < 2; ++i)
+    EXPECT_EQ(locale.systemLanguages(), (Names{"en", "de-DE", "zh-TW"}));
+  EXPECT_EQ(log.lines, Names{"cannot list " + folder + ": Too many levels of symbolic links"});
+  log.lines.clear();
+
   std::filesystem::remove(root.path("/etc/locale.conf"));
   ASSERT_EQ(mkfifo(root.path("/etc/locale.conf").c_str(), 0600), 0);
   EXPECT_EQ(locale.preferredLanguages(), Names{});

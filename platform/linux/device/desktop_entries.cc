@@ -37,16 +37,29 @@ bool hasLink(std::string folder) {
   return false;
 }
 
-std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
+// The error number of a walk, without those of folders that are missing or that this user may not
+// read: they have nothing to count.
+int failureOf(int code) {
+  return code == ENOENT || code == ENOTDIR || code == EACCES ? 0 : code;
+}
+
+void noteFailure(SystemLog& log, std::string_view what, const std::string& folder, int code) {
+  if (code == 0) return;
+  log.log(LogLevel::Error, "cannot list the %s in %s: %s; not all applications are counted", what,
+          folder, systemText(code));
+}
+
+std::vector<DataFolder> dataFolders(const DeviceRoot& root, SystemLog& log) {
   std::vector<DataFolder> folders;
   const auto addHome = [&](const std::string& home) {
     if (!hasLink(home)) folders.push_back({home + "/.local/share", PWUserApplicationType});
   };
   const std::string homes = root.path("/home");
-  walkFolder(homes, [&](const dirent& entry) {
+  const int code = walkFolder(homes, [&](const dirent& entry) {
     addHome(homes + '/' + entry.d_name);
     return true;
   });
+  noteFailure(log, "homes", homes, failureOf(code));
   std::sort(folders.begin(), folders.end(),
             [](const DataFolder& a, const DataFolder& b) { return a.path < b.path; });
   addHome(root.path("/root"));
@@ -57,7 +70,18 @@ std::vector<DataFolder> dataFolders(const DeviceRoot& root) {
   return folders;
 }
 
-bool isApplication(const std::string& path) {
+// Whether a failed opening shows that the file is no entry, or none that this user may read.
+bool isNoEntry(int code) {
+  return code == ENOENT || code == ENOTDIR || code == ELOOP || code == EINVAL || code == EFBIG ||
+         code == EACCES;
+}
+
+struct DesktopEntry {
+  bool isApplication = false;
+  int errorNumber = 0;
+};
+
+DesktopEntry readEntry(const std::string& path) {
   LineReader lines(path, limits::kDesktopEntryBytes);
   bool inEntry = false;
   bool application = false;
@@ -71,9 +95,9 @@ bool isApplication(const std::string& path) {
     const std::string_view key = line->substr(0, line->find_last_not_of(" \t", equals - 1) + 1);
     const std::string_view value = trimmed(line->substr(equals + 1));
     if (key == "Type") application = value == "Application";
-    if ((key == "NoDisplay" || key == "Hidden") && value == "true") return false;
+    if ((key == "NoDisplay" || key == "Hidden") && value == "true") return {};
   }
-  return application && lines.errorNumber() == 0;
+  return {application && lines.errorNumber() == 0, lines.errorNumber()};
 }
 
 bool isFolder(const std::string& path, const dirent& entry) {
@@ -89,7 +113,7 @@ class Enumeration {
 
   bool isFull() const { return isFull_; }
 
-  /// The error number of what ended it early, except for folders that may not be read.
+  /// The error number of what ended it early.
   int visit(const std::string& folder, const std::string& prefix, std::string_view bundleType,
             int depth = 0) {
     int inner = 0;
@@ -109,8 +133,7 @@ class Enumeration {
       }
       return !isFull_ && inner == 0;
     });
-    if (code == EACCES) return 0;
-    return code != 0 ? code : inner;
+    return inner != 0 ? inner : failureOf(code);
   }
 
  private:
@@ -134,7 +157,13 @@ class Enumeration {
       return;
     }
     seen_.insert(identifier);
-    if (isApplication(path)) handler_({std::move(identifier), bundleType});
+    const DesktopEntry entry = readEntry(path);
+    if (entry.isApplication) handler_({std::move(identifier), bundleType});
+    if (entry.errorNumber != 0 && !isNoEntry(entry.errorNumber) &&
+        !std::exchange(isUnreadTold_, true)) {
+      log_.log(LogLevel::Error, "cannot read %s: %s; not all applications are counted", path,
+               systemText(entry.errorNumber));
+    }
   }
 
   SystemLog& log_;
@@ -143,6 +172,7 @@ class Enumeration {
   std::size_t visited_ = 0;
   bool isFull_ = false;
   bool isDepthTold_ = false;
+  bool isUnreadTold_ = false;
 };
 
 }  // namespace
@@ -150,13 +180,11 @@ class Enumeration {
 void enumerateDesktopEntries(const DeviceRoot& root, SystemLog& log,
                              const std::function<void(const PWBundleProxy&)>& handler) {
   Enumeration enumeration(log, handler);
-  for (const DataFolder& folder : dataFolders(root)) {
+  for (const DataFolder& folder : dataFolders(root, log)) {
     const std::string top = folder.path + std::string(kApplicationsFolder);
     const int code = enumeration.visit(top, "", folder.bundleType);
     if (enumeration.isFull()) return;
-    if (code != 0 && code != ENOENT && code != ENOTDIR) {
-      log.log(LogLevel::Error, "cannot list the desktop entries in %s: %s", top, systemText(code));
-    }
+    noteFailure(log, "desktop entries", top, code);
   }
 }
 

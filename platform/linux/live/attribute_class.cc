@@ -46,7 +46,7 @@ std::vector<NamedDevice> devicesIn(const DeviceRoot& root, std::string_view fold
   std::vector<NamedDevice> devices;
   std::vector<std::string> entries;
   std::unordered_map<std::string, std::size_t> counts;
-  for (std::string& name : namesIn(base)) {
+  for (std::string& name : source.namesIn(base)) {
     std::string_view number;
     const bool isDevice =
         entry.ends_with('*') ? fitsPattern(name, entry, number) : name.starts_with(entry);
@@ -91,7 +91,7 @@ void addAttributes(const std::string& path, const Place& place, const std::strin
   };
   const std::vector<std::string> powerStatus =
       speed == Speed::Slow ? powerStatusOf(path) : std::vector<std::string>();
-  const std::vector<std::string> names = namesIn(path);
+  const std::vector<std::string> names = source.namesIn(path);
   for (const Attribute& attribute : attributes) {
     if (attribute.file.find('/') != std::string_view::npos) {
       std::string file = path + '/' + std::string(attribute.file);
@@ -116,7 +116,7 @@ void addDeviceClass(const DeviceRoot& root, const DeviceClass& devices, LiveSour
     addAttributes(device.path, {devices.group, device.name, kPlain}, device.name + '.',
                   devices.attributes, devices.speed, source);
     if (devices.partAttributes.empty()) continue;
-    for (const std::string& part : namesIn(device.path)) {
+    for (const std::string& part : source.namesIn(device.path)) {
       addAttributes(device.path + '/' + part, {devices.group, device.name, kPlain},
                     device.name + '.' + channelName(part) + '.', devices.partAttributes,
                     devices.speed, source);

@@ -54,9 +54,9 @@ using DiskNumbers = std::set<std::string, std::less<>>;  // "8:0"
 
 // The disks that are devices. Mappings and loops pass their I/O on to these, where it counts again.
 // Unlike `isOwnDevice`, this includes NVMe disks with several paths: paths have no number.
-DiskNumbers deviceNumbers(const DeviceRoot& root) {
+DiskNumbers deviceNumbers(const DeviceRoot& root, LiveSource& source) {
   DiskNumbers numbers;
-  for (const std::string& name : namesIn(root.path("/sys/block"))) {
+  for (const std::string& name : source.namesIn(root.path("/sys/block"))) {
     const std::string disk = root.path("/sys/block/" + name);
     if (exists(disk + "/device")) numbers.insert(firstLine(disk + "/dev"));
   }
@@ -114,7 +114,7 @@ void addIo(const std::string& path, const NamedDevice& slice,
 void addControlGroups(const DeviceRoot& root, LiveSource& source) {
   const bool isUnified = exists(root.path("/sys/fs/cgroup/cgroup.controllers"));
   const char* const folder = isUnified ? "/sys/fs/cgroup" : "/sys/fs/cgroup/unified";
-  const auto disks = std::make_shared<const DiskNumbers>(deviceNumbers(root));
+  const auto disks = std::make_shared<const DiskNumbers>(deviceNumbers(root, source));
   for (const NamedDevice& slice : devicesIn(root, folder, "", "", false, source)) {
     if (!exists(slice.path + "/cgroup.events")) continue;
     const std::string prefix = slice.name + '.';

@@ -8,7 +8,6 @@
 #include <sys/stat.h>
 
 #include "base/limits.h"
-#include "platform/linux/files/folder_walk.h"
 
 namespace tavrel::live {
 namespace {
@@ -90,16 +89,6 @@ std::string firstLine(const std::string& path) {
   TextBuffer buffer;
   const auto text = readKernelFile(path, ReadMode::Once, buffer);
   return text ? std::string(text->substr(0, text->find('\n'))) : std::string();
-}
-
-std::vector<std::string> namesIn(const std::string& folder) {
-  std::vector<std::string> names;
-  walkFolder(folder, [&names](const dirent& entry) {
-    names.emplace_back(entry.d_name);
-    return true;
-  });
-  std::sort(names.begin(), names.end());
-  return names;
 }
 
 bool exists(const std::string& path) {

@@ -7,7 +7,6 @@
 #include <span>
 #include <string>
 #include <string_view>
-#include <vector>
 
 #include "platform/linux/files/descriptor.h"
 
@@ -68,9 +67,6 @@ class KernelFile {
 
 /// The first line of a file, without its end; empty when it cannot be read.
 std::string firstLine(const std::string& path);
-
-/// Names in a folder, sorted, without "." and ".."; none when it cannot be read.
-std::vector<std::string> namesIn(const std::string& folder);
 
 bool exists(const std::string& path);
 bool isFolder(const std::string& path);

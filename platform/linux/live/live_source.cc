@@ -1,9 +1,13 @@
 #include "platform/linux/live/live_source.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <utility>
 
+#include "base/format.h"
 #include "base/limits.h"
+#include "base/system_text.h"
+#include "platform/linux/files/folder_walk.h"
 
 namespace tavrel::live {
 namespace {
@@ -38,6 +42,20 @@ std::uint32_t LiveSource::addMeasured(std::uint32_t slots,
   const std::uint32_t first = addSlots(slots);
   measured_.push_back({first, slots, std::move(measure)});
   return first;
+}
+
+std::vector<std::string> LiveSource::namesIn(const std::string& folder) {
+  std::vector<std::string> names;
+  const int code = walkFolder(folder, [&names](const dirent& entry) {
+    names.emplace_back(entry.d_name);
+    return true;
+  });
+  if (code != 0 && code != ENOENT && code != ENOTDIR && code != EACCES &&
+      !std::exchange(isListNoted_, true)) {
+    note(format("cannot list %s: %s; not everything in it is shown", folder, systemText(code)));
+  }
+  std::sort(names.begin(), names.end());
+  return names;
 }
 
 void LiveSource::add(const Place& place, LiveChannel channel) {

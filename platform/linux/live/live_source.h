@@ -116,6 +116,9 @@ class LiveSource {
   /// A line for the system log about what is not shown.
   void note(std::string line) { notes_.push_back(std::move(line)); }
   const std::vector<std::string>& notes() const { return notes_; }
+  /// Names in a folder, sorted, without "." and ".."; none when it is missing or this user may not
+  /// read it. The first folder that cannot be listed for another reason is noted.
+  std::vector<std::string> namesIn(const std::string& folder);
   /// Publishes the folds, in the order in which they were begun. Call this last.
   void publishFolds();
 
@@ -182,6 +185,7 @@ class LiveSource {
   std::vector<std::int64_t> slots_;
   std::unordered_set<std::uint64_t> ids_;
   std::vector<std::string> notes_;
+  bool isListNoted_ = false;
 };
 
 }  // namespace tavrel::live

@@ -9,6 +9,7 @@
 #include "base/ascii.h"
 #include "base/format.h"
 #include "base/limits.h"
+#include "platform/linux/files/folder_walk.h"
 #include "platform/linux/live/sources.h"
 #include "platform/linux/live/text_table.h"
 
@@ -27,10 +28,12 @@ bool isMountPoint(const std::string& folder, const std::string& parent) {
 // Records that the kernel left when it crashed. A folder that is not mounted looks empty, too.
 std::int64_t crashRecords(const std::string& folder, const std::string& parent) {
   std::int64_t count = 0;
-  for (const std::string& name : namesIn(folder))
-    count += name.starts_with("dmesg-") ? 1 : 0;
-  if (count > 0) return count;
-  return isMountPoint(folder, parent) && access(folder.c_str(), R_OK) == 0 ? 0 : kUnset;
+  const int code = walkFolder(folder, [&count](const dirent& entry) {
+    count += std::string_view(entry.d_name).starts_with("dmesg-") ? 1 : 0;
+    return true;
+  });
+  if (code != 0) return kUnset;
+  return count > 0 || isMountPoint(folder, parent) ? count : kUnset;
 }
 
 // The list of mounts escapes characters in octal: "\040" is a blank.

@@ -62,10 +62,11 @@ struct DeviceRows {
 };
 
 /// The rows that name devices to show, each name once.
-DeviceRows deviceRows(std::string_view text, const DeviceRoot& root, const DeviceTable& table) {
+DeviceRows deviceRows(std::string_view text, const DeviceRoot& root, const DeviceTable& table,
+                      LiveSource& source) {
   std::unordered_set<std::string> allowed;
   if (!table.only.empty()) {
-    for (std::string& name : namesIn(root.path(table.only)))
+    for (std::string& name : source.namesIn(root.path(table.only)))
       allowed.insert(std::move(name));
   }
   DeviceRows found;
@@ -170,7 +171,7 @@ void addDeviceTable(const DeviceRoot& root, const DeviceTable& table, LiveSource
   std::string path = root.path(table.path);
   const auto text = readKernelFile(path, ReadMode::ToEnd, buffer);
   if (!text) return;
-  const DeviceRows found = deviceRows(*text, root, table);
+  const DeviceRows found = deviceRows(*text, root, table, source);
   if (found.isCut || buffer.isCut()) {
     source.note(format("%s: only the first %zu rows are shown", path, found.rows.size()));
   }

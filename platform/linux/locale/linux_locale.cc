@@ -80,10 +80,15 @@ bool LinuxLocale::readLines(std::string_view path,
   }
   const int code = lines.errorNumber();
   if (code == ENOENT || code == ENOTDIR) return false;
-  if (code != 0 && told_.insert(file).second) {
-    log_.write(LogLevel::Error, systemError("read", file, code).message);
-  }
+  noteFailure("read", file, code);
   return true;
+}
+
+void LinuxLocale::noteFailure(std::string_view what, const std::string& path, int code) {
+  if (code == 0 || code == ENOENT || code == ENOTDIR) return;
+  if (told_.insert(path).second) {
+    log_.write(LogLevel::Error, systemError(what, path, code).message);
+  }
 }
 
 LinuxLocale::Variables LinuxLocale::readVariables() {
@@ -138,11 +143,12 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
     generated.emplace_back(line.substr(0, line.find_first_of(" \t\r")));
   });
   const std::string folder = root_.path(kGeneratedLocalesFolder);
-  walkFolder(folder, [&](const dirent& entry) {
+  const int code = walkFolder(folder, [&](const dirent& entry) {
     const auto status = FileSystem::status(folder + '/' + entry.d_name);
     if (status && S_ISDIR(status->st_mode)) generated.emplace_back(entry.d_name);
     return true;
   });
+  noteFailure("list", folder, code);
   std::sort(generated.begin(), generated.end());
   LanguageList languages;
   languages.add(std::string(kUntranslated));

@@ -37,9 +37,10 @@ class LinuxLocale final : public Locale {
   using Variables = std::map<std::string, std::string, std::less<>>;
   Variables readVariables();
 
-  /// Calls `use` with each significant line. False when the file is missing. Logs once that an
-  /// existing file cannot be read.
+  /// Calls `use` with each significant line. False when the file is missing.
   bool readLines(std::string_view path, const std::function<void(std::string_view line)>& use);
+  /// Logs once that a path exists but cannot be used.
+  void noteFailure(std::string_view what, const std::string& path, int code);
 
   const DeviceRoot& root_;
   SystemLog& log_;
