@@ -76,18 +76,23 @@ void Tidy::remember(const TidyReport& report) {
   static_cast<void>(files_.replace(path, asBytes(lines), 0644));
 }
 
+std::optional<std::int64_t> Tidy::lastRunDay() {
+  bool hasRun = false;
+  const std::int64_t day =
+      lowInt32(preferences_.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun));
+  return hasRun ? std::optional(day) : std::nullopt;
+}
+
 // Days recorded while the clock was ahead, then the oldest. Days that wait to be reported are left
 // out: today, yesterday until its run, and the two days after the last run, which were today and
 // yesterday before a clock went wrong.
 std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& days) {
   const std::int64_t today = store_.BHDaysSince1970();
-  bool hasRun = false;
-  const std::int64_t lastRun =
-      lowInt32(preferences_.ZTXPreferencesGetIntegerValue(kLastRunDayKey, kTavrelDomain, &hasRun));
+  const auto lastRun = lastRunDay();
   std::vector<std::int32_t> order;
   std::ranges::copy_if(days, std::back_inserter(order), [&](std::int32_t day) {
-    if (day == today || (hasRun && day <= lastRun)) return day != today;
-    const bool waits = day == today - 1 || (hasRun && day <= lastRun + 2);
+    if (day == today || (lastRun && day <= *lastRun)) return day != today;
+    const bool waits = day == today - 1 || (lastRun && day <= *lastRun + 2);
     return !waits;
   });
   std::stable_partition(order.begin(), order.end(),
@@ -119,7 +124,11 @@ void Tidy::trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::
     bytes = (*trim)->bytesInUse();
   }
   if (!bytes) return fail(bytes.error());
-  tidied.exceeds = failures.empty() && exceeds();
+  // Until the run of yesterday, which frees that day, the device may well keep its limits.
+  const std::int32_t yesterday = previousDay(store_.BHDaysSince1970());
+  const bool isRunDue =
+      std::ranges::binary_search(*days, yesterday) && lastRunDay().value_or(INT64_MIN) < yesterday;
+  tidied.exceeds = failures.empty() && exceeds() && !isRunDue;
   const Status given = (*trim)->giveBack(reserveOf(*bytes, left, bounds));
   if (!given) fail(given.error());
 }

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -33,7 +34,7 @@ struct TidiedKind {
   std::int64_t removed = 0;        // items
   std::int64_t early = 0;          // of these, days of the store within its limit of days
   std::vector<std::int32_t> days;  // of the store, the removed ones
-  bool exceeds = false;            // what must stay takes more than the store's bounds
+  bool exceeds = false;  // what must stay takes more than the store's bounds, with no run to come
 };
 
 struct TidyReport {
@@ -70,6 +71,7 @@ class Tidy {
   void remember(const TidyReport& report);
   void trimStore(const Bounds& bounds, TidiedKind& tidied, std::vector<std::string>& failures);
   std::vector<std::int32_t> removalOrder(const std::vector<std::int32_t>& days);
+  std::optional<std::int64_t> lastRunDay();
   Expected<KeptUse> measureStore();
   void count(const TidyReport& report, std::vector<std::string>& failures);
 
