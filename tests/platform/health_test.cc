@@ -378,6 +378,7 @@ TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
   answers.whileAsked = [this] {
     run(3);
     put(*answers.smart, 48, {4});
+    write("/sys/class/mtd/mtd0/ecc_failures", "2\n");
     answers.killer = "nvme2";
     EXPECT_THROW(readAll(3000), std::bad_alloc);
     answers.killer = "none";
@@ -386,6 +387,7 @@ TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
   EXPECT_EQ(readings()["nvme0"].time, 2000) << "the later run has left it out";
   EXPECT_EQ(readings()["nvme1"].time, 3000);
   EXPECT_EQ(readings()["nvme2"].time, 2000) << "the later run has not read it";
+  EXPECT_EQ(readings()["mtd0"].time, 3000) << "the drive came after the beginning of this run";
   EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 2 * 512'000);
   EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 2 * 512'000);
 }

@@ -210,16 +210,28 @@ bool HealthReader::keep() {
   return static_cast<bool>(kept);
 }
 
-bool HealthReader::removeGone(const std::vector<Drive>& drives) {
+Expected<std::vector<Drive>> HealthReader::lookForDrives() {
+  auto drives = findDrives(Machine(root_));
+  if (!drives) {
+    log_.log(LogLevel::Error, "cannot look for drives: %s", drives.error().message);
+  }
+  return drives;
+}
+
+// Looks for drives after it has listed the readings, so that a drive which has come since the run
+// began keeps the reading that a later run has made.
+bool HealthReader::removeGone() {
   const std::string folder = root_.path(kReadingsFolder);
   const auto names = files_.list(folder);
   if (!names) {
     log_.log(LogLevel::Error, "%s", names.error().message);
     return false;
   }
+  const auto drives = lookForDrives();
+  if (!drives) return false;
   for (const std::string& name : *names) {
     const bool isThere = std::ranges::any_of(
-        drives, [&](const Drive& drive) { return drive.name + ".plist" == name; });
+        *drives, [&](const Drive& drive) { return drive.name + ".plist" == name; });
     if (!isThere) files_.discard(folder + '/' + name);
   }
   return true;
@@ -291,11 +303,8 @@ bool HealthReader::readWithCommands(const Drive& drive) {
 }
 
 bool HealthReader::readAll(std::int64_t nowSeconds) {
-  auto drives = findDrives(Machine(root_));
-  if (!drives) {
-    log_.log(LogLevel::Error, "cannot look for drives: %s", drives.error().message);
-    return false;
-  }
+  auto drives = lookForDrives();
+  if (!drives) return false;
   const auto runDay = lastRunDay();
   if (!runDay) {
     log_.log(LogLevel::Error, "readings have no growth: %s", runDay.error().message);
@@ -316,7 +325,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
     memory_.forgetOld(moment_.seconds);
     isDone = lock && keep() && isDone;
   }
-  return removeGone(*drives) && isDone;
+  return removeGone() && isDone;
 }
 
 }  // namespace tavrel::health

@@ -59,7 +59,8 @@ class HealthReader {
   bool store(std::span<Taken> taken, bool isMemoryLocked);
   bool write(const Reading& reading);
   bool keep();
-  bool removeGone(const std::vector<Drive>& drives);
+  Expected<std::vector<Drive>> lookForDrives();
+  bool removeGone();
 
   const DeviceRoot& root_;
   FileSystem& files_;
