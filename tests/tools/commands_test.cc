@@ -25,6 +25,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       {"prefs set d k -inf --float",
        "no option '-inf': put -- before it if it is a value: see 'tavrelctl prefs set --help'"},
       {"prefs set d k v -x", "no option '-x': see 'tavrelctl prefs set --help'"},
+      {"log list -", "unexpected argument '-': see 'tavrelctl log list --help'"},
       {"log list -5", "no option '-5': see 'tavrelctl log list --help'"},
       {"log list -- -5", "unexpected argument '-5': see 'tavrelctl log list --help'"},
       {"prefs get a", "KEY is required: see 'tavrelctl prefs get --help'"},

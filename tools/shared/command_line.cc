@@ -36,7 +36,7 @@ std::string usageFault(const CLI::App& app, const std::vector<std::string>& argu
     const std::string& first = unknown.front();
     const auto values = std::ranges::find(arguments, "--");
     const bool isValue = std::find(values, arguments.end(), first) != arguments.end();
-    if (first.starts_with('-') && !isValue) {
+    if (first.size() > 1 && first.starts_with('-') && !isValue) {
       fault = format("no option '%s'", first);
       if (!first.starts_with("--") && takesMore(*command))
         fault += ": put -- before it if it is a value";
