@@ -74,8 +74,7 @@ std::string timeText(double seconds) {
 }  // namespace
 
 std::string shortNumber(double value) {
-  if (!std::isfinite(value) || value == std::trunc(value))
-    return grouped(tavrel::numberText(value));
+  if (!std::isfinite(value) || value == std::trunc(value)) return exactNumber(value);
   const double magnitude = std::floor(std::log10(std::abs(value)));
   if (magnitude >= 3) return grouped(tavrel::numberText(std::round(value)));
   const double scale = std::pow(10, 3 - magnitude);
@@ -85,6 +84,10 @@ std::string shortNumber(double value) {
 
 std::string shortNumber(std::int64_t value) {
   return grouped(std::to_string(value));
+}
+
+std::string exactNumber(double value) {
+  return grouped(tavrel::numberText(value));
 }
 
 std::string figureText(double value, std::string_view unit) {

@@ -12,6 +12,9 @@ namespace tavrel::page {
 std::string shortNumber(double value);
 std::string shortNumber(std::int64_t value);
 
+/// All digits of a number, in groups: for labels that must differ when their numbers do.
+std::string exactNumber(double value);
+
 /// A number with its unit, as named in catalogue/. Sizes, times and electrical units get prefixes:
 /// "1.5 GiB", "12.5 ms", "3.2 days", "41.3 °C". Percentages are "12 %", counts have no unit, and
 /// any other unit follows the number.

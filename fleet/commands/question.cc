@@ -55,7 +55,7 @@ Question::Question(FleetContext& context, const QuestionOptions& options)
   }
   if (!options.days.empty()) {
     try {
-      days_ = readDays(options.days).value_or(DayRange{});
+      days_ = readDays(options.days);
     } catch (const UsageError& error) {
       throw UsageError("--days: " + std::string(error.what()));
     }

@@ -42,7 +42,10 @@ class Question {
   Engine& engine() { return *engine_; }
   const LogTable& table() const { return table_; }
   Ledger& ledger() { return ledger_; }
-  const DayRange& days() const { return days_; }
+  /// Those of --days; all without it, or when it is a number of days and no day has enough devices.
+  DayRange days() const { return days_.value_or(DayRange{}); }
+  /// Whether --days is a number of days, but no day has enough devices.
+  bool lacksDays() const { return !days_; }
 
   /// A number of days ends with the newest day that has enough devices. Without such a day returns
   /// nothing: then nothing can be shown, not even the day of a log. Throws UsageError.
@@ -58,7 +61,7 @@ class Question {
   LogTable table_;
   Ledger ledger_;
   const std::vector<std::string> versions_;
-  DayRange days_;
+  std::optional<DayRange> days_ = DayRange{};
 };
 
 /// Runs a question and turns UsageError into a usage failure.

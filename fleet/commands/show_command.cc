@@ -31,7 +31,7 @@ void readAgainst(Question& question, const std::string& text, ShowRequest& reque
   if (std::ranges::find(question.versions(), text) == question.versions().end()) {
     try {
       request.againstDays = question.readDays(text);
-      if (!request.againstDays)
+      if (!request.againstDays || question.lacksDays())
         throw std::runtime_error(tooFewText(question.ledger().devicesAtLeast()));
     } catch (const UsageError&) {
       // Then it must be part of a version.

@@ -40,17 +40,24 @@ std::string cellText(double value, std::string_view unit) {
   return text;
 }
 
-std::string intervalText(const Interval& interval, std::string_view unit) {
+/// `text` writes one end.
+template <class Text>
+std::string intervalText(const Interval& interval, const Text& text) {
   if (std::isinf(interval.lower) && std::isinf(interval.upper)) return "not known";
-  if (std::isinf(interval.lower)) return "up to " + cellText(interval.upper, unit);
-  if (std::isinf(interval.upper)) return "above " + cellText(interval.lower, unit);
-  return cellText(interval.lower, unit) + " to " + cellText(interval.upper, unit);
+  if (std::isinf(interval.lower)) return "up to " + text(interval.upper);
+  if (std::isinf(interval.upper)) return "above " + text(interval.lower);
+  return text(interval.lower) + " to " + text(interval.upper);
 }
 
 std::string percentileText(const ShownSet& set, std::size_t index, std::string_view unit) {
   if (set.scalar) return cellText(static_cast<double>(set.scalar->percentiles[index]), unit);
   if (index >= set.histogram.percentiles.size()) return "";
-  return intervalText(set.histogram.percentiles[index], unit);
+  const Interval& interval = set.histogram.percentiles[index];
+  const auto shortText = [unit](double end) { return cellText(end, unit); };
+  // Ends that shortening makes alike are written in full, in the unit above the table.
+  return shortText(interval.lower) == shortText(interval.upper)
+             ? intervalText(interval, page::exactNumber)
+             : intervalText(interval, shortText);
 }
 
 std::string meanText(const ShownSet& set, std::string_view unit) {
@@ -92,8 +99,8 @@ void writeHistogramOf(page::HtmlWriter& html, const ShownSet& set, const std::st
   for (const Piece& piece : set.histogram.pieces) {
     std::string count = countText(piece.least);
     if (piece.least != piece.most) count += " to " + countText(piece.most);
-    bars.push_back(
-        {intervalText({piece.lower, piece.upper}, ""), static_cast<double>(piece.least), count});
+    bars.push_back({intervalText({piece.lower, piece.upper}, page::exactNumber),
+                    static_cast<double>(piece.least), count});
   }
   if (bars.size() < 2) return;
   html.begin("div", {{"class", "card"}});

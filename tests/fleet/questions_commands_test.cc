@@ -180,6 +180,22 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_EQ(page.find("<script"), std::string::npos);
 }
 
+TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
+  std::vector<LogRecord> all;
+  for (std::uint64_t device = 0; device < 20; ++device) {
+    LogRecord& record = all.emplace_back(makeRecord(device, 20779));
+    record.osVersion = kOld;
+    record.distributions = {{"near", {1000.3, 1000.5, 1000.4, 0.02, 2}}};
+    record.cells = {{"near", 1000.2, 1000.4, "(1000.2, 1000.4]", 1},
+                    {"near", 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
+  }
+  openEngine(file, OpenMode::kWrite)->append(all);
+  const std::string page = run(file, {"page", "-o", "-"}).out;
+  for (const char* label : {">1000.2 to 1000.4<", ">1000.4 to 1000.6<"})
+    EXPECT_THAT(page, ContainsRegex(std::string("<li><span><bdi>[^>]*") + label)) << label;
+  EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4</td>"));
+}
+
 TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   load(file, 1);
   const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 64).out;
@@ -292,6 +308,9 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
        2,
        "--against: 2026-11-24 and all days overlap: choose separate days with --days; for a "
        "version, write more of its name"},
+      {{"show", "=sum", "--devices-at-least", "5000", "--days", "1", "--against", "2026-11-20"},
+       1,
+       "fewer than 5000 devices: nothing is shown"},
       {{"show", "=sum", "--against", "5.0"},
        1,
        "version \"5.0\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "

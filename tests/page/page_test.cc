@@ -83,6 +83,7 @@ TEST(NumberTest, IsShortAndHasItsUnit) {
                                                      {kNan, "nan"}};
   for (const auto& [value, text] : kNumbers)
     EXPECT_EQ(shortNumber(value), text);
+  EXPECT_EQ(exactNumber(-12345.678901), "−12\u202F345.678901");
   EXPECT_EQ(shortNumber(std::numeric_limits<std::int64_t>::min()),
             "−9\u202F223\u202F372\u202F036\u202F854\u202F775\u202F808");
   const std::tuple<double, const char*, const char*> kFigures[] = {
