@@ -91,6 +91,12 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   ASSERT_TRUE(KeptValues(device.path(kStore)).add({{0, today + 7, 1, "k"}}));
   EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 8);
   EXPECT_EQ(device.run("allow --from=-1").status, 2);
+  device.run("deny");
+  ASSERT_TRUE(KeptValues(device.path(kStore)).add({{0, 2147483646, 1, "k"}}));
+  device.check("allow",
+               fails("no day is later than what is recorded: erase that, or give --from DAY", 1));
+  device.check("allow --from 2147483647",
+               fails("day 2147483647 never comes: give at most 2147483646", 2));
   device.check(
       "allow --from soon",
       fails("not a day: soon: give today, yesterday, a 32-bit day number or YYYY-MM-DD", 2));
@@ -118,8 +124,8 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
          "2.5 --float"},
         {"com.norvane.da Radio", "no", "a boolean, not \"no\"", "true|false --bool"},
         {"com.norvane.zentrix com.norvane.x", "1 --int", "a boolean, not 1", "true|false --bool"},
-        {"com.norvane.zentrix DiagnosticSubmissionFirstDay", "2147483648 --int",
-         "an integer of 0 to 2147483647, not 2147483648", ""},
+        {"com.norvane.zentrix DiagnosticSubmissionFirstDay", "2147483647 --int",
+         "an integer of 0 to 2147483646, not 2147483647", ""},
         {"com.norvane.da AggressiveSubmissionDays", "-1 --int",
          "an integer of 0 to 2147483647, not -1", "3 --int"}}) {
     const std::string name = key;
@@ -177,8 +183,11 @@ TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
     EXPECT_EQ(seteuid(0), 0);
     return outcome;
   };
-  const std::string unseen = "tavrelctl: cannot list " + refused +
-                             ": Permission denied; run as root or as the owner of the files";
+  const auto unlisted = [this](const char* place) {
+    return "tavrelctl: cannot list " + device.path(kSubmission + place) +
+           ": Permission denied; run as root or as the owner of the files";
+  };
+  const std::string unseen = unlisted("refused");
   const std::tuple<const char*, int, const char*> kCases[] = {
       {"status", 0, "\nRefused logs     unreadable\n"},
       {"log list", 1, " outbox  StorageStatus-2.log\n"},
@@ -189,10 +198,20 @@ TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
     const Outcome outcome = run(command);
     EXPECT_EQ(outcome.status, status) << outcome;
     EXPECT_NE((outcome.out + outcome.error).find(shown), std::string::npos) << outcome;
-    EXPECT_EQ(outcome.error.find(unseen) == 0, std::string_view(command) != "status") << outcome;
+    EXPECT_EQ(outcome.error.find(unseen) == 0, status != 0) << outcome;
   }
   fs::remove(device.path(kSubmission + "outbox/log-tallied-1.log"));
   EXPECT_EQ(run("log show latest"), fails(unseen.substr(11)));
+  fileLogs({"withheld/StorageStatus-4"});
+  fs::permissions(device.path(kSubmission + "withheld"), fs::perms{0700});
+  const std::string both = unlisted("withheld") + "\n" + unseen + "\n";
+  for (const char* command : {"log list", "log show StorageSt", "nandlog show"})
+    EXPECT_EQ(run(command).error.substr(0, both.size()), both) << command;
+  EXPECT_EQ(run("log show StorageSt").error, both);
+  EXPECT_EQ(run("log show StorageStatus-2").error, "");
+  EXPECT_EQ(
+      run("log show StorageStatus-4").error,
+      both + "tavrelctl: no log or file StorageStatus-4: 'tavrelctl log list' shows the logs\n");
 }
 
 TEST_F(Consent, ErasesWhereverItIsKilled) {

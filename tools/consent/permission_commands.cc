@@ -22,6 +22,9 @@
 namespace tavrel {
 namespace {
 
+// The day after it withholds everything.
+constexpr std::int32_t kLastFirstDay = SubmissionPermission::kNoDay - 1;
+
 struct AllowArguments {
   std::string from;
 };
@@ -61,7 +64,7 @@ Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today)
                         latest.error().message)};
   }
   const std::int32_t last = std::max(latest->value_or(today), today);
-  if (last == std::numeric_limits<std::int32_t>::max()) {
+  if (last >= kLastFirstDay) {
     return Error{"no day is later than what is recorded: erase that, or give --from DAY"};
   }
   return last + 1;
@@ -112,6 +115,9 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   if (isNamed && *first < 0) {
     return context.failUsage(
         format("day %s is before 1970: give a number of days since then", dayText(*first)));
+  }
+  if (isNamed && *first > kLastFirstDay) {
+    return context.failUsage(format("day %d never comes: give at most %d", *first, kLastFirstDay));
   }
   if (!isNamed && stored->isGiven && !stored->firstDay)
     return printAlreadyAllowed(context, *stored, today);

@@ -6,6 +6,7 @@
 #include <limits>
 
 #include "base/format.h"
+#include "platform/linux/logs/submission_permission.h"
 #include "tools/shared/value_text.h"
 
 namespace tavrel {
@@ -33,6 +34,10 @@ bool isAmplification(const plist::Value& value) {
 constexpr Form kBoolean{"a boolean", "true|false --bool",
                         [](const plist::Value& value) { return value.boolean().has_value(); }};
 constexpr Form kCount{"an integer of 0 to 2147483647", "3 --int", isCount};
+constexpr Form kFirstDay{"an integer of 0 to 2147483646", "", [](const plist::Value& value) {
+                           return isCount(value) &&
+                                  value.number()->int64() != SubmissionPermission::kNoDay;
+                         }};
 constexpr Form kString{"a string", "TEXT --string",
                        [](const plist::Value& value) { return value.string().has_value(); }};
 constexpr Form kDate{"a date", "2026-11-27T18:02:18Z --date",
@@ -53,7 +58,7 @@ struct KnownPreference {
 // The list of docs/files.md. In two domains, the other keys are named after what they switch.
 constexpr std::array kKnown = {
     KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionEnabled", kBoolean},
-    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kCount},
+    KnownPreference{"com.norvane.zentrix", "DiagnosticSubmissionFirstDay", kFirstDay},
     KnownPreference{"com.norvane.zentrix", "", kBoolean},
     KnownPreference{"com.norvane.da", "AggressiveSubmissionDays", kCount},
     KnownPreference{"com.norvane.da", "", kBoolean},

@@ -38,28 +38,20 @@ bool isRegular(FiledLog& log) {
   return !log.status || S_ISREG(log.status->st_mode);
 }
 
-// The logs of all folders, as their file names describe them. `unseen` receives the reason why
-// withheld or refused ones cannot be seen; when it is null, a note gives the reason.
-Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context,
-                                            std::optional<Unseen>* unseen = nullptr) {
+// The logs of all folders, as their file names describe them.
+Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context, std::vector<Unseen>& unseen) {
   using enum FileSubmission::Place;
   std::vector<FiledLog> logs;
-  std::optional<Unseen> closed;
   for (const auto place : {Withheld, Refused, Outbox, Pending}) {
     auto found = context.linuxPlatform().submission().files(place);
     // Only root may see withheld logs, and on some devices refused ones; other users get the rest.
     if (!found && (place == Withheld || place == Refused)) {
-      closed = Unseen{found.error(), place};
+      unseen.push_back({found.error(), place});
       continue;
     }
     if (!found) return found.error();
     for (FileSubmission::FiledLog& log : *found)
       logs.push_back({std::move(log), std::nullopt});
-  }
-  if (unseen != nullptr) {
-    *unseen = std::move(closed);
-  } else if (closed) {
-    context.note(closed->message);
   }
   return logs;
 }
@@ -86,13 +78,17 @@ std::string_view nameOf(FileSubmission::Place place) {
   return kNames[static_cast<std::size_t>(place)];
 }
 
+LogEnvelope envelopeOf(const FiledLog& log) {
+  return {std::string(nameOf(log.place)), log.path, log.metadata};
+}
+
 std::string fileNameOf(const FiledLog& log) {
   return log.path.substr(log.path.rfind('/') + 1);
 }
 
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
-  std::optional<Unseen> unseen;
-  auto files = filesOfLogs(context, &unseen);
+  std::vector<Unseen> unseen;
+  auto files = filesOfLogs(context, unseen);
   if (!files) return files.error();
   FiledLogs filed{*std::move(files), 0, std::move(unseen)};
   if (filed.logs.size() > most) {
@@ -114,9 +110,21 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
   return filed;
 }
 
-Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name) {
-  auto logs = filesOfLogs(context);
+Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name) {
+  std::vector<Unseen> unseen;
+  auto logs = filesOfLogs(context, unseen);
   if (!logs) return logs;
+  // A log in both folders, for example after a power cut, is still waiting.
+  const auto named = std::find_if(logs->rbegin(), logs->rend(), [&](FiledLog& log) {
+    return (name == log.path || name == log.name || name == fileNameOf(log)) && isRegular(log);
+  });
+  if (named != logs->rend()) {
+    context.linuxPlatform().submission().readMetadata(*named);
+    return std::vector{std::move(*named)};
+  }
+  if (name.find('/') != std::string_view::npos) return std::vector<FiledLog>();
+  for (const Unseen& folder : unseen)
+    context.note(folder.message);
   std::erase_if(*logs, [name](const FiledLog& log) { return !log.name.starts_with(name); });
   readFacts(context, *logs);
   return logs;
@@ -124,9 +132,9 @@ Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::st
 
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts,
-                                            std::optional<Unseen>& unseen) {
+                                            std::vector<Unseen>& unseen) {
   FileSubmission& submission = context.linuxPlatform().submission();
-  auto files = filesOfLogs(context, &unseen);
+  auto files = filesOfLogs(context, unseen);
   if (!files) return files.error();
   std::vector<std::pair<double, FiledLog>> candidates;
   for (FiledLog& log : *files) {
@@ -156,18 +164,6 @@ Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_vi
     if (found != newest.rend()) return std::optional(std::move(*found));
   }
   return std::optional<FiledLog>();
-}
-
-std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name) {
-  auto files = filesOfLogs(context);
-  if (!files) return std::nullopt;
-  // A log in both folders, for example after a power cut, is still waiting.
-  const auto found = std::find_if(files->rbegin(), files->rend(), [&](FiledLog& log) {
-    return (name == log.path || name == log.name || name == fileNameOf(log)) && isRegular(log);
-  });
-  if (found == files->rend()) return std::nullopt;
-  context.linuxPlatform().submission().readMetadata(*found);
-  return std::move(*found);
 }
 
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs) {

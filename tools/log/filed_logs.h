@@ -9,6 +9,7 @@
 #include <vector>
 
 #include "platform/linux/logs/file_submission.h"
+#include "tools/log/log_document.h"
 #include "tools/shared/tool_context.h"
 
 namespace tavrel {
@@ -21,6 +22,8 @@ struct FiledLog : FileSubmission::FiledLog {
 /// "pending", "outbox", "withheld" or "refused".
 std::string_view nameOf(FileSubmission::Place place);
 
+LogEnvelope envelopeOf(const FiledLog& log);
+
 /// The name of its file, with the extension.
 std::string fileNameOf(const FiledLog& log);
 
@@ -30,27 +33,26 @@ struct Unseen : Error {
 };
 
 struct FiledLogs {
-  std::vector<FiledLog> logs;         // oldest first
-  std::size_t older = 0;              // older logs that were left out
-  std::optional<Unseen> unseen = {};  // withheld or refused ones
+  std::vector<FiledLog> logs;  // oldest first
+  std::size_t older = 0;       // older logs that were left out
+  std::vector<Unseen> unseen;  // folders of withheld or refused ones
 };
 
 /// The newest logs of all folders, at most `most`, chosen by file name:
 /// metadata is read only for these.
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
 
-/// The logs of all folders whose names begin with `name`, oldest first.
-Expected<std::vector<FiledLog>> filedLogsBeginning(ToolContext& context, std::string_view name);
+/// The logs that `name` identifies: that of this path or of this file name, with or without the
+/// extension; when there is none, those whose names begin with `name`, oldest first. For names
+/// without a slash, notes then say which folders cannot be seen.
+Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name);
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes; nothing when there
 /// is none. The choice goes by file names, so few metadata files are read. `unseen` receives the
-/// reason why withheld or refused logs cannot be seen.
+/// reasons why withheld or refused logs cannot be seen.
 Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_view namePrefix,
                                             const std::function<bool(const FiledLog&)>& accepts,
-                                            std::optional<Unseen>& unseen);
-
-/// The filed log that `name` identifies: its path, or its file name with or without the extension.
-std::optional<FiledLog> filedLogNamed(ToolContext& context, std::string_view name);
+                                            std::vector<Unseen>& unseen);
 
 /// Says once why logs lack metadata. A failure when metadata exists but cannot be read.
 void noteMissingMetadata(ToolContext& context, const std::vector<FiledLog>& logs);

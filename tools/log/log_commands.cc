@@ -43,29 +43,24 @@ struct Arguments {
 /// The log that `name` identifies: "latest" (of the daily logs), the name of a filed log or the
 /// beginning of one, or a path of this machine.
 Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
-  std::optional<FiledLog> found;
-  if (name == "latest") {
-    std::optional<Unseen> unseen;
-    auto latest = newestLog(
-        context, kTalliedLogName, [](const FiledLog&) { return true; }, unseen);
-    if (!latest) return latest.error();
-    // No daily log is withheld, but one that was refused may be the latest.
-    if (unseen && unseen->place == FileSubmission::Place::Refused) {
-      if (!*latest) return *unseen;
-      context.fail(unseen->message);
-    }
-    if (!*latest) {
-      const LogConclusion conclusion = concludeOnLogs(context);
-      return Error{format(
-          "no daily log found; %s run: %s; 'tavrelctl log preview' shows what a log would contain",
-          conclusion.run(), conclusion.text())};
-    }
-    found = std::move(*latest);
-  } else {
-    found = filedLogNamed(context, name);
+  if (name != "latest") return logNamed(context, name);
+  std::vector<Unseen> unseen;
+  const auto latest = newestLog(
+      context, kTalliedLogName, [](const FiledLog&) { return true; }, unseen);
+  if (!latest) return latest.error();
+  // No daily log is withheld, but one that was refused may be the latest.
+  const auto refused = std::ranges::find(unseen, FileSubmission::Place::Refused, &Unseen::place);
+  if (refused != unseen.end()) {
+    if (!*latest) return *refused;
+    context.fail(refused->message);
   }
-  if (!found) return logBeginning(context, name);
-  return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
+  if (!*latest) {
+    const LogConclusion conclusion = concludeOnLogs(context);
+    return Error{format(
+        "no daily log found; %s run: %s; 'tavrelctl log preview' shows what a log would contain",
+        conclusion.run(), conclusion.text())};
+  }
+  return envelopeOf(**latest);
 }
 
 bool isNamedAsDaily(const LogEnvelope& envelope) {

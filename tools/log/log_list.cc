@@ -74,7 +74,7 @@ void listLogs(ToolContext& context, std::size_t most) {
     const auto day = readDay(context, log, obstacles);
     const bool isForced = isSurelyForced(log, day);
     if (context.json()) {
-      Json entry = jsonOfEnvelope({std::string(nameOf(log.place)), log.path, log.metadata});
+      Json entry = jsonOfEnvelope(envelopeOf(log));
       entry["bytes"] = status ? Json(status->st_size) : Json(nullptr);
       entry["day"] = day ? Json(*day) : Json(nullptr);
       entry["date"] = day ? Json(dayDateText(*day)) : Json(nullptr);
@@ -89,14 +89,16 @@ void listLogs(ToolContext& context, std::size_t most) {
   if (context.json()) {
     context.printJson({{"logs", std::move(entries)}, {"older_logs", filed->older}});
   } else if (table.empty()) {
-    if (!filed->unseen) context.out() << "no logs\n";
+    if (filed->unseen.empty()) context.out() << "no logs\n";
   } else {
     table.print(context.page());
   }
   if (filed->older > 0 && !context.json()) {
     context.out() << counted(filed->older, "older log") << " not shown: see --all\n";
   }
-  if (filed->unseen) return context.fail(filed->unseen->message);
+  for (const Unseen& folder : filed->unseen)
+    context.fail(folder.message);
+  if (!filed->unseen.empty()) return;
   if (obstacles.unread) {
     context.fail(obstacles.unread->message + "; the day of such a log is not shown");
   }
@@ -107,29 +109,27 @@ void listLogs(ToolContext& context, std::size_t most) {
   noteMissingMetadata(context, filed->logs);
 }
 
-Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name) {
+Expected<LogEnvelope> logNamed(ToolContext& context, const std::string& name) {
   const LogEnvelope file{"file", name, {}};
-  if (name == "-" || name.empty() || name.find('/') != std::string::npos) return file;
-  const auto logs = filedLogsBeginning(context, name);
-  if (!logs && !FileSystem::status(name)) return logs.error();
+  if (name == "-" || name.empty()) return file;
+  const bool isFile = name.find('/') != std::string::npos || FileSystem::status(name);
+  const auto logs = filedLogsNamed(context, name);
+  if (!logs && !isFile) return logs.error();
   if (!logs) return file;
-  const FiledLog* found = nullptr;
   std::set<std::string_view> names;
-  for (const FiledLog& log : *logs) {
-    found = &log;
+  for (const FiledLog& log : *logs)
     names.insert(log.name);
-  }
   if (names.size() > 1) {
     return Error{
         format("%s is the beginning of %zu logs: give more of the name: 'tavrelctl log "
                "list' shows them",
                name, names.size())};
   }
-  if (!found && !FileSystem::status(name)) {
+  if (!logs->empty()) return envelopeOf(logs->back());
+  if (!isFile) {
     return Error{format("no log or file %s: 'tavrelctl log list' shows the logs", name)};
   }
-  if (!found) return file;
-  return LogEnvelope{std::string(nameOf(found->place)), found->path, found->metadata};
+  return file;
 }
 
 }  // namespace tavrel

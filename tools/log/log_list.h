@@ -1,4 +1,4 @@
-// The list of filed logs, and the lookup of a log by the beginning of its name.
+// The list of filed logs, and the lookup of a log by its name.
 #pragma once
 
 #include <cstddef>
@@ -14,8 +14,9 @@ namespace tavrel {
 /// day that each log reports.
 void listLogs(ToolContext& context, std::size_t most);
 
-/// The only filed log whose name begins with `name`; when there is none, a file of this machine, or
-/// standard input for "-". When several match, the error says how many.
-Expected<LogEnvelope> logBeginning(ToolContext& context, const std::string& name);
+/// The filed log of this path or name, or the only one whose name begins with `name`; when there is
+/// none, a file of this machine, or standard input for "-". When several names begin so, the error
+/// says how many.
+Expected<LogEnvelope> logNamed(ToolContext& context, const std::string& name);
 
 }  // namespace tavrel

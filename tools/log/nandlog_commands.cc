@@ -206,20 +206,21 @@ bool isNandLog(const FiledLog& log) {
 }
 
 void show(ToolContext& context) {
-  std::optional<Unseen> unseen;
+  std::vector<Unseen> unseen;
   const auto found = newestLog(context, kNandLogName, isNandLog, unseen);
   if (!found) return context.fail(found.error().message);
-  if (unseen) context.fail(unseen->message);
+  for (const Unseen& folder : unseen)
+    context.fail(folder.message);
   const std::optional<FiledLog>& newest = *found;
   const NextLog next = nextLog(context);
   Json document = {{"log", nullptr}, {"next", jsonOf(next)}};
   std::string fault;
-  if (!newest && unseen) {
+  if (!newest && !unseen.empty()) {
     // It may be among those.
   } else if (!newest) {
     fault = "no NAND log found: a run writes one when write amplification is high";
   } else {
-    const LogEnvelope envelope{std::string(nameOf(newest->place)), newest->path, newest->metadata};
+    const LogEnvelope envelope = envelopeOf(*newest);
     const auto text =
         context.linuxPlatform().fileSystem().read(newest->path, limits::kPropertyListBytes);
     const auto log = text ? parseNandLog(*text) : std::nullopt;
