@@ -199,6 +199,26 @@ It would file no log: the run for day YESTERDAY (DATE) is already done
 )");
 }
 
+TEST(Rehearse, SaysWhyNothingIsSentOn) {
+  const Rehearsed device;
+  device.write("/tasking.plist", xmlOf(R"({"TaskingID": "t"})"));
+  device.run("prefs set com.norvane.Drovelink ScheduledTasking @" + device.path("/tasking.plist") +
+             " --plist");
+  device.run("prefs set com.norvane.da AggressiveSubmissionDays 3 --int");
+  const auto sentOn = [&device] {
+    const std::string out = device.run("rehearse --today").out;
+    const std::size_t at = out.find("  would send on ");
+    return at == std::string::npos ? out : out.substr(at, out.find('\n', at) - at);
+  };
+  EXPECT_EQ(sentOn(), "  would send on the pending logs");
+  const std::string kPermission = "/var/mobile/Library/Preferences/com.norvane.zentrix.plist";
+  device.write(kPermission, "damaged");
+  EXPECT_EQ(sentOn().find("  would send on nothing: cannot read " + device.path(kPermission)), 0U)
+      << sentOn();
+  device.run("deny");
+  EXPECT_EQ(sentOn(), "  would send on nothing: submission is not allowed");
+}
+
 TEST(Rehearse, CountsTheLogsThatAWithdrawalLeftBehind) {
   const Rehearsed device;
   const std::string pending = "/var/mobile/Library/Logs/Submission/pending/log-tallied-2026-11-2";

@@ -124,8 +124,9 @@ plist::Value OverlaySubmission::ZTXGetDATaskingValue(std::string_view key) {
 }
 
 void OverlaySubmission::submitDiagnosticLogs() {
+  const Status permitted = below_.checkPermission();
   events_.tell(OverlayEvent::Kind::SendOn,
-               below_.maySendOn() ? "the pending logs" : "nothing: submission is not allowed");
+               permitted ? "the pending logs" : "nothing: " + permitted.error().message);
 }
 
 void OverlaySubmission::tellDeletion() {

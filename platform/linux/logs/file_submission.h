@@ -85,8 +85,9 @@ class FileSubmission final : public SubmissionService {
   /// Where a log made now, from the rows read last, would go; an error when it would not be filed.
   Expected<Place> placeOfNewLog(std::string_view logType);
 
-  /// Whether `submitDiagnosticLogs` may send logs on.
-  bool maySendOn() const { return static_cast<bool>(checkPermission()); }
+  /// An error when storage does not have the owner's permission, without which
+  /// `submitDiagnosticLogs` sends nothing on.
+  Status checkPermission() const;
   /// How many logs a run without permission would delete; 0 while storage has one or cannot be
   /// read.
   std::size_t countOfWaiting() const;
@@ -126,8 +127,6 @@ class FileSubmission final : public SubmissionService {
   Status commit(NewFile& file, const Destination& destination, const std::string& name,
                 const std::string& metadata);
   Status moveToOutbox(const std::string& name);
-  /// An error when storage does not have the owner's permission.
-  Status checkPermission() const;
   RemovedLogs removeLogs(std::initializer_list<std::string_view> folders,
                          bool onlyWithoutPermission);
   void completeWithdrawal();
