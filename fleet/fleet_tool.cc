@@ -28,9 +28,10 @@ void addGlobalOptions(CLI::App& app, const Command& top, FleetContext& context) 
   app.require_subcommand(1);
   app.footer("--database may appear anywhere on the line. See tavrel-fleet(1).");
   app.set_version_flag("--version", "tavrel-fleet " + std::string(version()));
-  top.addOption("--database", context.database(),
-                "File of the tables, or clickhouse[s]://HOST[:PORT]/NAME[?cluster=NAME]")
-      .typeName("FILE")
+  top.addOption(
+         "--database", context.database(),
+         "File of the tables, or clickhouse[s]://[USER@]HOST[:PORT]/NAME[?OPTION=VALUE[&...]]")
+      .typeName("WHERE")
       .showDefault()
       .check(databaseFault);
 }

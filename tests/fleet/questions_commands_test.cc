@@ -213,6 +213,12 @@ TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   EXPECT_EQ(compared.find("…"), std::string::npos);
 }
 
+TEST_F(QuestionCommands, ShareBracketsInTheManualOnlyIfAllExcludeEachOther) {
+  root.write("/page", "@command show\n");
+  EXPECT_THAT(run(file, {"completion", "man", root.root.path("/page")}).out,
+              HasSubstr(" [\\fB\\-\\-json\\fR | \\fB\\-\\-csv\\fR] [\\fB\\-\\-buckets\\fR] "));
+}
+
 TEST_F(QuestionCommands, CompleteInBash) {
   load(file, 1);
   const std::string folder = root.root.path("");
@@ -361,8 +367,8 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
                   "no database has an address that begins with \"http://\": write "
                   "clickhouse:// for a server; ./http://… is a file"),
         {"clickhouse://h/d?a=b",
-         "the database's address has the unknown option \"a\": write "
-         "clickhouse://[USER@]HOST[:PORT]/DATABASE[?cluster=NAME]"}}) {
+         "the database's address has the unknown option \"a\": give cluster, password-file, "
+         "ca-file, timeout or retries"}}) {
     const Output output = run(where, {"summary"});
     EXPECT_EQ(output.error, "tavrel-fleet: --database: " + std::string(message) +
                                 ": see 'tavrel-fleet summary --help'\n");

@@ -20,7 +20,7 @@ constexpr int kMostRetries = 20;
 
 [[noreturn]] void refuse(const std::string& what) {
   throw EngineError("the database's address " + what +
-                    ": write clickhouse://[USER@]HOST[:PORT]/DATABASE[?cluster=NAME]");
+                    ": write clickhouse[s]://[USER@]HOST[:PORT]/NAME[?OPTION=VALUE[&...]]");
 }
 
 struct Free {
@@ -40,7 +40,7 @@ void checkName(const std::string& what, std::string_view name) {
     return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
   };
   if (name.empty() || !std::all_of(name.begin(), name.end(), isPlain))
-    refuse("needs a name of letters, digits and underscores as its " + what);
+    refuse("needs a " + what + " with a name of letters, digits and underscores");
 }
 
 std::string passwordIn(const std::string& path) {
@@ -90,7 +90,8 @@ void readOptions(ServerAddress& address, std::string_view query) {
     } else if (name == "retries") {
       address.retries = numberIn("retries", value, 0, kMostRetries);
     } else {
-      refuse("has the unknown option \"" + std::string(name) + '"');
+      throw EngineError("the database's address has the unknown option \"" + std::string(name) +
+                        "\": give cluster, password-file, ca-file, timeout or retries");
     }
   }
 }

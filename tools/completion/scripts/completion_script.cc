@@ -18,7 +18,7 @@ const OptionModel& CompletedProgram::anywhereOption() const {
 std::string_view CompletedProgram::valueKind(const CommandModel& command,
                                              const OptionModel& option) const {
   static constexpr std::pair<std::string_view, std::string_view> kPaths[] = {{"FILE", "files"},
-                                                                             {"OUTPUT", "files"},
+                                                                             {"WHERE", "files"},
                                                                              {"FILE2", "files"},
                                                                              {"PATH", "files"},
                                                                              {"DIR", "folders"}};

@@ -44,17 +44,24 @@ std::string usageOf(const OptionModel& option) {
   return text;
 }
 
-// Options that exclude each other share one pair of brackets.
+bool excludes(const OptionModel& option, const OptionModel& other) {
+  return std::ranges::find(option.excludes, other.name()) != option.excludes.end();
+}
+
+// Options that all exclude each other share one pair of brackets.
 std::string usageOf(const CommandModel& command) {
   std::string line = strong(command.path);
   std::set<std::string> written;
   for (const OptionModel& option : command.options) {
     if (!written.insert(option.name()).second) continue;
     std::string text = usageOf(option);
+    std::vector<const OptionModel*> together{&option};
     for (const OptionModel& other : command.options) {
-      const bool excludes =
-          std::ranges::find(option.excludes, other.name()) != option.excludes.end();
-      if (excludes && written.insert(other.name()).second) text += " | " + usageOf(other);
+      const bool excludesAll = std::ranges::all_of(
+          together, [&other](const OptionModel* one) { return excludes(*one, other); });
+      if (!excludesAll || !written.insert(other.name()).second) continue;
+      text += " | " + usageOf(other);
+      together.push_back(&other);
     }
     line += option.isRequired ? ' ' + text : " [" + text + "]";
   }
