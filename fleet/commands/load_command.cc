@@ -3,9 +3,11 @@
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
+#include <sys/stat.h>
 
 #include "base/format.h"
 #include "fleet/loading/load.h"
+#include "platform/linux/files/system_error.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -64,6 +66,10 @@ void load(FleetContext& context, const LoadOptions& options) {
             context.note(line);
           },
       .progress = [&](const LoadCounts& counts) { progress.show(counts); }};
+  for (const std::string& path : options.request.paths) {
+    if (struct stat status{}; stat(path.c_str(), &status) != 0)
+      return context.fail(systemError("read", path).message + ": check the path");
+  }
   const auto engine = context.openDatabase(OpenMode::kWrite);
   LoadRequest request = options.request;
   if (!options.setAside.empty()) request.setAside = options.setAside;
