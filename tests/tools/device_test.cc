@@ -81,9 +81,10 @@ TEST(Send, NotificationsArePostedAndAwaited) {
             R"({"format_version": 1, "name": "org.example.n", "count": 2})"_json);
   for (const std::string name : {"a/b", ".x"})
     device.check("notify post " + name,
-                 fails("\"" + name +
-                       "\" is not the name of a notification: give letters, digits, '.', '-' and "
-                       "'_', not beginning with '.', at most 64"));
+                 fails("NAME: not the name of a notification: " + name +
+                           ": give letters, digits, '.', '-' and '_', not beginning with '.', at "
+                           "most 64: see 'tavrelctl notify post --help'",
+                       2));
 }
 
 struct TaskingTest : testing::Test {

@@ -95,11 +95,22 @@ void post(ToolContext& context, const std::string& name) {
   printCount(context, name, *count);
 }
 
+std::string notificationFault(const std::string& name) {
+  if (isServiceName(name)) return {};
+  return format(
+      "not the name of a notification: %s: give letters, digits, '.', '-' and '_', not "
+      "beginning with '.', at most %zu",
+      name, limits::kServiceNameBytes);
+}
+
 }  // namespace
 
 Expected<plist::Array> appDataOf(const plist::Value& applications) {
   const plist::Array elements = applications.array();
-  if (!elements) return Error{"not an array of applications"};
+  if (!elements)
+    return Error{
+        "not an array of applications: give dictionaries with \"bundle_id\", \"version\" and "
+        "\"uuid\""};
   plist::Array result = plist::Array::create(elements.size());
   for (std::size_t i = 0; i < elements.size(); ++i) {
     const plist::Dictionary application = elements.at(i).dictionary();
@@ -132,7 +143,7 @@ void addSendCommands(Command app, ToolContext& context) {
   const Command group = app.addGroup("send", "Send a message to the service, as a client does");
 
   const Command announceCommand =
-      group.addCommand("announce", "Announce that app information will be delivered");
+      group.addCommand("announce", "Announce that application information will be delivered");
   announceCommand.onRun([&context] {
     send(context, {{"operation", kAnnounceAppInfo}}, "Announced app information.");
   });
@@ -143,7 +154,7 @@ void addSendCommands(Command app, ToolContext& context) {
   forceCommand.addOption("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD").required();
   forceCommand.onRun([&context, day] { force(context, *day); });
 
-  const Command deliverCommand = group.addCommand("deliver", "Deliver app information");
+  const Command deliverCommand = group.addCommand("deliver", "Deliver application information");
   const auto file = std::make_shared<std::string>();
   deliverCommand
       .addOption("FILE", *file,
@@ -155,19 +166,21 @@ void addSendCommands(Command app, ToolContext& context) {
 }
 
 void addNotifyCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("notify", "Notifications");
+  const Command group = app.addGroup("notify", "Wait for and post notifications");
   const auto name = std::make_shared<std::string>();
   const auto timeout = std::make_shared<std::string>();
 
   const Command waitCommand = group.addCommand("wait", "Wait until a notification is posted");
-  waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging").required();
+  waitCommand.addOption("NAME", *name, "Such as com.norvane.tallied.tavrel.logging")
+      .required()
+      .check(notificationFault);
   waitCommand.addOption("--timeout", *timeout, "Give up after this time, with exit status 1")
       .typeName("SECONDS");
   context.addJsonOption(waitCommand);
   waitCommand.onRun([&context, name, timeout] { wait(context, *name, *timeout); });
 
   const Command postCommand = group.addCommand("post", "Post a notification");
-  postCommand.addOption("NAME", *name, "The notification").required();
+  postCommand.addOption("NAME", *name, "The notification").required().check(notificationFault);
   context.addJsonOption(postCommand);
   postCommand.onRun([&context, name] { post(context, *name); });
 }

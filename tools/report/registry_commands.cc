@@ -169,7 +169,7 @@ std::string secondsFault(const std::string& text) {
 }  // namespace
 
 void addRegistryCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("registry", "Services of recorded and live drivers");
+  const Command group = app.addGroup("registry", "Show and record drivers");
   const auto arguments = std::make_shared<Arguments>();
 
   context.addJsonOption(addCommand(group, "list", "List the services", arguments, context, list));

@@ -166,7 +166,7 @@ Command addSelecting(Command group, const char* name, const char* description,
 }  // namespace
 
 void addReportCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("report", "Report channels that drivers publish");
+  const Command group = app.addGroup("report", "List and sample the report channels of drivers");
   const auto arguments = std::make_shared<Arguments>();
 
   const Command listed = addSelecting(group, "list", "List channels by driver, group and subgroup",

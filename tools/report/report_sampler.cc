@@ -33,7 +33,9 @@ Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
     return;
   }
   if (IOReportGetChannelCount(*selected) == 0) {
-    context.fail("no such channel is published: 'tavrelctl report list' shows what there is");
+    context.fail(selection.isEmpty()
+                     ? format("no channels: recordings of drivers belong in %s", kRecordingFolder)
+                     : std::string("no channel matches: 'tavrelctl report list' shows all"));
     return;
   }
   std::optional<ErrorObject> error;

@@ -100,8 +100,9 @@ void addSelectionOptions(Command command, ReportSelection& selection) {
   command
       .addOption("--driver", selection.driver, "Only channels of this driver: its name or its id")
       .typeName("DRIVER");
-  command.addFlag("--live", selection.live, "Only channels of this machine's kernel");
-  command.addFlag("--recorded", selection.recorded, "Only channels of recordings");
+  const Option live =
+      command.addFlag("--live", selection.live, "Only channels of this machine's kernel");
+  command.addFlag("--recorded", selection.recorded, "Only channels of recordings").excludes(live);
 }
 
 Expected<plist::Dictionary> selectChannels(Platform& platform, const ReportSelection& selection) {

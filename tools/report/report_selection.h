@@ -24,7 +24,10 @@ struct ReportSelection {
   std::string unit;       // a label or a number
   std::string driver;     // the name, with or without the id, or the id
   bool live = false;      // only of live services
-  bool recorded = false;  // only of recorded ones; both flags together select all
+  bool recorded = false;  // only of recorded ones; at most one of the two is set
+
+  bool isEmpty() const { return *this == ReportSelection{}; }
+  bool operator==(const ReportSelection&) const = default;
 };
 
 void addSelectionOptions(Command command, ReportSelection& selection);
