@@ -15,11 +15,14 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
       "bytes "
       "as --plist '{\"$data\": \"BASE64\"}'";
   const std::pair<CommandLine, std::string> kCases[] = {
-      {"", "A subcommand is required: see 'tavrelctl --help'"},
+      {"", "name a subcommand: see 'tavrelctl --help'"},
       {"frob x", "no subcommand 'frob': see 'tavrelctl --help'"},
       {"log --frob", "no option '--frob': see 'tavrelctl log --help'"},
       {"log frob", "no subcommand 'frob': see 'tavrelctl log --help'"},
-      {"log", "A subcommand is required: see 'tavrelctl log --help'"},
+      {"log", "name a subcommand: see 'tavrelctl log --help'"},
+      {"--root", "--root needs a value: DIR: see 'tavrelctl --help'"},
+      {"plist convert --to yaml x",
+       "--to: not xml, binary or json: yaml: see 'tavrelctl plist convert --help'"},
       {"log list --limit 5", "no option '--limit': see 'tavrelctl log list --help'"},
       {"log list x", "unexpected argument 'x': see 'tavrelctl log list --help'"},
       {"prefs set d k -inf --float",
@@ -42,10 +45,10 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "cannot be stored: cannot encode the property list, value /: the date is beyond any "
        "calendar"},
       {"prefs set a k 1 --int --bool",
-       "Requires at most 1 options be given from [--string,--bool,--int,--float,--date,--plist]: "
-       "see "
-       "'tavrelctl prefs set --help'"},
-      {"log show --raw --json", "--raw excludes --json: see 'tavrelctl log show --help'"},
+       "give at most one of --string, --bool, --int, --float, --date and --plist: see 'tavrelctl "
+       "prefs set --help'"},
+      {"log show --raw --json",
+       "--raw and --json exclude each other: see 'tavrelctl log show --help'"},
       {CommandLine{"log", "preview", "--day", ""},
        "--day: must not be empty: see 'tavrelctl log preview --help'"},
       {"erase --key= --yes", "--key: must not be empty: see 'tavrelctl --help'"},
@@ -279,10 +282,14 @@ TEST(LogList, SaysWhichLogCannotBeRead) {
                                  path, limits::kPropertyListBytes));
   device.fileLog(name, "<plist>\n", R"({"LogName": "log-tallied"})");
   EXPECT_EQ(device.run("log list").error, "tavrelctl: damaged: 1 log, the first " + path +
-                                              ": 'tavrelctl log show' says what is wrong\n");
+                                              ": 'tavrelctl log show FILE' says what is wrong\n");
   device.check("log show", fails(path + " is damaged: XML property list, line 2, column 1: no "
-                                        "element found: 'tavrelctl log show --raw' prints its "
-                                        "bytes"));
+                                        "element found: 'tavrelctl log show --raw FILE' "
+                                        "prints its bytes"));
+  device.write("/empty", "");
+  const std::string empty = device.path("/empty");
+  device.check({"log", "show", empty},
+               fails("not a log: " + empty + ": it is empty: 'tavrelctl log list' shows the logs"));
 }
 
 TEST(LogShow, SaysWhyThereIsNoLog) {

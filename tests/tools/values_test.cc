@@ -109,6 +109,7 @@ TEST(Table, AlignsAndCutsTheWidestColumn) {
             "  ü                1\n"
             "  a\\x1b[31m\\n\\…   10\n"
             "  a long key i…  100\n");
+  EXPECT_EQ(printed(table, 14), printed(table)) << "cutting would not make it fit";
   // In a pipe, nothing is cut, and a long cell pushes only its own row to the right.
   const std::string longKey(100, 'k');
   table.add({longKey, "1"});

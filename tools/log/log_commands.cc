@@ -107,8 +107,13 @@ void show(ToolContext& context, const Arguments& arguments) {
   }
   if (value) return showDocument(context, *envelope, value->dictionary());
   if (isNamedAsDaily(*envelope)) {
-    return context.fail(format("%s is damaged: %s: 'tavrelctl log show --raw' prints its bytes",
-                               envelope->path, value.error().message));
+    return context.fail(
+        format("%s is damaged: %s: 'tavrelctl log show --raw FILE' prints its bytes",
+               envelope->path, value.error().message));
+  }
+  if (bytes->empty()) {
+    return context.fail(
+        format("not a log: %s: it is empty: 'tavrelctl log list' shows the logs", envelope->path));
   }
   if (bytes->find('\0') != std::string::npos || !isValidUtf8(*bytes)) {
     return context.fail(
@@ -170,12 +175,13 @@ void preview(ToolContext& context, const Arguments& arguments) {
 }  // namespace
 
 void addLogCommands(Command app, ToolContext& context) {
-  const Command group = app.addGroup("log", "Show submitted logs, and what would be submitted");
+  const Command group =
+      app.addGroup("log", "Show the logs that were filed, and what would be filed");
   const auto arguments = std::make_shared<Arguments>();
 
   const Command previewCommand = group.addCommand(
       "preview",
-      "Print the document that a run would submit, with or without permission; changes nothing");
+      "Print the log that a run would file, with or without permission; changes nothing");
   previewCommand
       .addOption("--day", arguments->day,
                  "today, yesterday (default), a day number or YYYY-MM-DD, UTC")
@@ -185,14 +191,15 @@ void addLogCommands(Command app, ToolContext& context) {
   context.addJsonOption(previewCommand);
   previewCommand.onRun([&context, arguments] { preview(context, *arguments); });
 
-  const Command listCommand = group.addCommand("list", "List the logs that were submitted");
+  const Command listCommand =
+      group.addCommand("list", "List the logs that wait, are withheld or were refused");
   context.addJsonOption(listCommand);
   listCommand.addFlag("--all", arguments->all, "Show all; without it, the newest 100");
   listCommand.onRun([&context, arguments] {
     listLogs(context, arguments->all ? std::numeric_limits<std::size_t>::max() : kShownLogs);
   });
 
-  const Command showCommand = group.addCommand("show", "Show a submitted log");
+  const Command showCommand = group.addCommand("show", "Show a log that was filed");
   showCommand
       .addOption("FILE", arguments->file,
                  "A log of 'log list' or the beginning of its name, a path, - for standard input, "

@@ -103,7 +103,7 @@ void listLogs(ToolContext& context, std::size_t most) {
     context.fail(obstacles.unread->message + "; the day of such a log is not shown");
   }
   if (obstacles.damaged > 0) {
-    context.fail(format("damaged: %s, the first %s: 'tavrelctl log show' says what is wrong",
+    context.fail(format("damaged: %s, the first %s: 'tavrelctl log show FILE' says what is wrong",
                         counted(obstacles.damaged, "log"), obstacles.firstDamaged));
   }
   noteMissingMetadata(context, filed->logs);

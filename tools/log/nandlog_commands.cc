@@ -248,7 +248,7 @@ void show(ToolContext& context) {
 
 void addNandlogCommands(Command app, ToolContext& context) {
   const Command group =
-      app.addGroup("nandlog", "The text log of the flash storage's health, at most one a week");
+      app.addGroup("nandlog", "Show the text log of the flash storage's health");
   const Command showCommand =
       group.addCommand("show", "Show the newest NAND log, and when the next one may be written");
   context.addJsonOption(showCommand);

@@ -10,7 +10,9 @@
 #include <vector>
 
 #include "base/ascii.h"
+#include "base/format.h"
 #include "base/parse_number.h"
+#include "tools/shared/word_list.h"
 
 namespace tavrel {
 namespace {
@@ -47,7 +49,17 @@ Option Option::showDefault() const {
 }
 
 Option Option::oneOf(std::initializer_list<std::string> values) const {
-  option_->check(CLI::IsMember(values));
+  // The description in braces is what modelOf() reads.
+  const std::vector<std::string> list(values);
+  std::string choices;
+  for (const std::string& value : list)
+    choices += (choices.empty() ? "" : ",") + value;
+  option_->check(CLI::Validator(
+      [list](const std::string& text) {
+        const bool isOne = std::ranges::find(list, text) != list.end();
+        return isOne ? std::string() : format("not %s: %s", listed(list, "or"), text);
+      },
+      "{" + choices + "}"));
   return *this;
 }
 

@@ -2,9 +2,12 @@
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
+#include <sstream>
+#include <string_view>
 #include <utility>
 
 #include "base/format.h"
+#include "tools/shared/word_list.h"
 
 namespace tavrel {
 namespace {
@@ -19,6 +22,34 @@ bool takesMore(const CLI::App& command) {
               .empty();
 }
 
+// CLI11's words for a fault, in the words of the other messages.
+std::string inOurWords(const std::string& fault) {
+  constexpr std::string_view kNoSubcommand = "A subcommand is required";
+  constexpr std::string_view kTooMany = "Requires at most 1 options be given from [";
+  constexpr std::string_view kNoValue = ": 1 required ";
+  constexpr std::string_view kMissing = " missing";
+  constexpr std::string_view kExcludes = " excludes ";
+  if (fault == kNoSubcommand) return "name a subcommand";
+  if (fault.starts_with(kTooMany) && fault.ends_with(']')) {
+    std::vector<std::string> options;
+    std::istringstream list(fault.substr(kTooMany.size(), fault.size() - kTooMany.size() - 1));
+    for (std::string option; std::getline(list, option, ',');)
+      options.push_back(option);
+    return "give at most one of " + listed(options, "and");
+  }
+  if (const std::size_t at = fault.find(kNoValue);
+      at != std::string::npos && fault.ends_with(kMissing)) {
+    const std::size_t type = at + kNoValue.size();
+    return fault.substr(0, at) +
+           " needs a value: " + fault.substr(type, fault.size() - type - kMissing.size());
+  }
+  if (const std::size_t at = fault.find(kExcludes); at != std::string::npos) {
+    return fault.substr(0, at) + " and " + fault.substr(at + kExcludes.size()) +
+           " exclude each other";
+  }
+  return fault;
+}
+
 // Describes what is wrong with a command line, and names the subcommand whose help to read.
 std::string usageFault(const CLI::App& app, const std::vector<std::string>& arguments,
                        const CLI::ParseError& error) {
@@ -28,7 +59,7 @@ std::string usageFault(const CLI::App& app, const std::vector<std::string>& argu
     command = command->get_subcommands().front();
     line += ' ' + command->get_name();
   }
-  std::string fault = error.what();
+  std::string fault = inOurWords(error.what());
   const auto unknown = app.remaining(true);
   const bool isExtra = dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr;
   const bool isMissing = dynamic_cast<const CLI::RequiredError*>(&error) != nullptr;

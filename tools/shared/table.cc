@@ -134,8 +134,8 @@ std::vector<std::size_t> Table::widths(const Page& page) const {
   if (page.columns && taken > *page.columns && widest) {
     std::size_t& width = widths[*widest];
     const std::size_t surplus = taken - *page.columns;
-    const std::size_t narrowest = std::min(kNarrowestColumn, width);
-    width = width > surplus + narrowest ? width - surplus : narrowest;
+    // Otherwise the terminal wraps the line in any case, so that nothing need be lost.
+    if (width >= surplus + kNarrowestColumn) width -= surplus;
   }
   return widths;
 }
