@@ -274,7 +274,7 @@ void addEraseCommand(Command app, ToolContext& context) {
   command.addFlag("--yes", arguments->yes, "Do not ask");
   command.setFooter(
       "Without --key, the structured records of the days are erased too. Preferences stay. See\n"
-      "docs/consent.md.");
+      "tavrelctl(1).");
   context.addJsonOption(command);
   command.onRun([&context, arguments] { run(context, *arguments); });
 }

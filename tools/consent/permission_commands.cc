@@ -194,7 +194,7 @@ void addAllowCommand(Command app, ToolContext& context) {
   command.setFooter(
       "Nothing that was recorded before leaves the device, unless --from names an earlier day. "
       "See\n"
-      "docs/consent.md.");
+      "tavrelctl(1).");
   context.addJsonOption(command);
   command.onRun([&context, arguments] { allow(context, *arguments); });
 }

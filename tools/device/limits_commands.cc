@@ -109,7 +109,7 @@ void tidy(ToolContext& context, bool isQuiet) {
 
 void addLimitsCommand(Command app, ToolContext& context) {
   const Command command = app.addCommand(
-      "limits", "Show how much the device keeps, beside its limits (docs/limits.md)");
+      "limits", "Show how much the device keeps, beside its limits");
   context.addJsonOption(command);
   command.onRun([&context] { showLimits(context); });
 }

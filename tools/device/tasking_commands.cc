@@ -181,7 +181,7 @@ void clear(ToolContext& context) {
 
 void addTaskingCommands(Command app, ToolContext& context) {
   const Command group =
-      app.addGroup("tasking", "Preference settings that are scheduled for the device");
+      app.addGroup("tasking", "Show and schedule preference settings for the device");
 
   const Command showCommand =
       group.addCommand("show", "Show the scheduled and the applied tasking");

@@ -48,7 +48,7 @@ void addExportCommands(Command app, ToolContext& context) {
   metrics
       .addOption("-o,--output", arguments->output,
                  "File to write, in one step; - is standard output")
-      .typeName("OUTPUT")
+      .typeName("FILE")
       .showDefault();
   metrics
       .addOption("--day", arguments->day,

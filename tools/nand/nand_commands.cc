@@ -282,7 +282,7 @@ void addNandCommands(Command app, ToolContext& context) {
   addFile(buildCommand, "Its entries, as nand parse --json prints them; - is standard input")
       .required();
   buildCommand.addOption("-o,--output", arguments->output, "File to write; - is standard output")
-      .typeName("OUTPUT")
+      .typeName("FILE")
       .required();
   buildCommand.onRun([&context, arguments] { build(context, *arguments); });
 }

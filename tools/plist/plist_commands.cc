@@ -81,7 +81,7 @@ void addPlistCommands(Command app, ToolContext& context) {
   convertCommand
       .addOption("-o,--output", arguments->output,
                  "File to write, in one step; - is standard output")
-      .typeName("OUTPUT")
+      .typeName("FILE")
       .showDefault();
   convertCommand.onRun([&context, arguments] { convert(context, *arguments); });
 }

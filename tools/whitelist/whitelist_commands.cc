@@ -155,7 +155,7 @@ void addWhitelistCommands(Command app, ToolContext& context) {
       group.addCommand("explain", "Show which rule applies to a key, and its options");
   explainCommand.addOption("KEY", arguments->keys, "Statistics keys").required();
   explainCommand.addOption("--value", arguments->value, "Also show how this value is coarsened")
-      .typeName("N");
+      .typeName("NUMBER");
   explainCommand
       .addOption("--file", arguments->file,
                  "Whitelist (default: the device's own); - is standard input")
