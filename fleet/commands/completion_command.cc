@@ -68,6 +68,9 @@ void addCompletionCommand(Command top, FleetContext& context) {
   command.onRun([&context, arguments, top] {
     const std::string& what = arguments->what;
     if (what == "versions") return listVersions(context);
+    if (what == "man" && arguments->file.empty()) {
+      return context.failUsage("completion man needs FILE, the template of the page");
+    }
     if (what == "man") return printManPage(context, arguments->file, modelOf(top));
     const CompletedProgram program = completedProgram(top);
     context.out() << (what == "bash"  ? bashScript(program)

@@ -118,8 +118,8 @@ void printCsv(std::ostream& out, const SummaryAnswer& answer) {
   }
 }
 
-void printKeys(FleetContext& context, const QuestionOptions& options,
-               const std::vector<Key>& keys) {
+void printKeys(FleetContext& context, const QuestionOptions& options, const std::vector<Key>& keys,
+               std::size_t devicesAtLeast) {
   const auto entryOf = [](const Key& key) {
     const catalogue::Entry* entry = catalogue::findStatistic(key.name);
     return entry != nullptr ? *entry : catalogue::Entry{};
@@ -149,6 +149,10 @@ void printKeys(FleetContext& context, const QuestionOptions& options,
     const catalogue::Entry entry = entryOf(key);
     table.add({key.name, kindName(key.kind), std::string(entry.unit), std::string(entry.meaning)});
   }
+  if (table.empty()) {
+    context.out() << "no statistic of at least " << devicesAtLeast << " devices\n";
+    return;
+  }
   table.print(context.page());
 }
 
@@ -166,7 +170,8 @@ void addSummaryCommand(Command top, FleetContext& context) {
       if (options->keys) {
         return printKeys(context, *options,
                          shownKeys(question.engine(), question.ledger(),
-                                   logsOn(question.table(), question.days())));
+                                   logsOn(question.table(), question.days())),
+                         question.ledger().devicesAtLeast());
       }
       const SummaryAnswer answer = summarise(question.engine(), question.ledger(), question.days());
       if (context.json()) return context.printJson(summaryJson(answer));

@@ -359,6 +359,8 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   }
   EXPECT_EQ(run(file, {"summary", "--days", "7", "--devices-at-least", "41"}).out,
             "All logs: fewer than 41 devices: nothing is shown\n");
+  EXPECT_EQ(run(file, {"summary", "--keys", "--devices-at-least", "41"}).out,
+            "no statistic of at least 41 devices\n");
   const Output against = run(file, {"show", "=sum", "--against", "7", "--devices-at-least", "41"});
   EXPECT_EQ(against.error, "tavrel-fleet: fewer than 41 devices: nothing is shown\n");
   EXPECT_EQ(against.status, 1);

@@ -51,7 +51,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "--raw and --json exclude each other: see 'tavrelctl log show --help'"},
       {CommandLine{"log", "preview", "--day", ""},
        "--day: must not be empty: see 'tavrelctl log preview --help'"},
-      {"erase --key= --yes", "--key: must not be empty: see 'tavrelctl --help'"},
+      {"erase --key= --yes", "--key: must not be empty: see 'tavrelctl erase --help'"},
+      {"completion man", "completion man needs FILE, the template of the page"},
       {CommandLine{"plist", "convert", ""},
        "FILE: must not be empty: see 'tavrelctl plist convert --help'"},
       {CommandLine{"whitelist", "diff", "", ""},
@@ -171,17 +172,19 @@ TEST(Plist, ConvertsBetweenAllForms) {
                fails("cannot write xml: standard input: it has text with control characters: use "
                      "--to binary or --to json"),
                R"({"a": ["\u0001"]})");
-  device.check("plist convert - -o " + no + "/x",
-               fails("cannot write " + no + "/x: " + no + ": No such file or directory"), json);
+  device.check(
+      "plist convert - -o " + no + "/x",
+      fails("cannot write " + no + "/x: " + no + ": No such file or directory: create this folder"),
+      json);
   EXPECT_FALSE(std::filesystem::exists(no));
   device.check("plist show -",
                fails("standard input: neither a property list nor JSON: it begins neither with "
                      "\"bplist00\" nor with \"<\", \"{\" or \"[\""),
                "hello");
   device.check("plist show -",
-               fails("standard input: parse error at line 1, column 4: syntax error while parsing "
-                     "value - unexpected end of input; expected '[', '{', or a literal"),
-               "[1,");
+               fails("standard input: not JSON at column 4: unexpected end of input"), "[1,");
+  device.check("plist show -",
+               fails("standard input: not JSON at line 2, column 2: invalid literal"), "[1,\nx]");
 }
 
 // A whitelist, and a day's statistics including one scalar that may not leave.

@@ -109,6 +109,9 @@ void addCompletionCommand(Command program, ToolContext& context) {
     if (what == "days") return listDays(context);
     if (what == "domains") return listDomains(context);
     if (what == "logs") return listLogs(context);
+    if (what == "man" && arguments->file.empty()) {
+      return context.failUsage("completion man needs FILE, the template of the page");
+    }
     if (what == "man") return printManPage(context, arguments->file, modelOf(program));
     const CompletedProgram completed = completedProgram(program);
     context.out() << (what == "bash"  ? bashScript(completed)

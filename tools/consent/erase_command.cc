@@ -268,7 +268,7 @@ void addEraseCommand(Command app, ToolContext& context) {
       .typeName("PREFIX");
   command
       .addOption("--from", arguments->from,
-                 "The first day: today, yesterday, a number or YYYY-MM-DD, UTC")
+                 "The first day: today, yesterday, a day number or YYYY-MM-DD, UTC")
       .typeName("DAY");
   command.addOption("--to", arguments->to, "The last day").typeName("DAY");
   command.addFlag("--yes", arguments->yes, "Do not ask");

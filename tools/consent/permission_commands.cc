@@ -188,7 +188,7 @@ void addAllowCommand(Command app, ToolContext& context) {
       app.addCommand("allow", "Allow logs to leave the device, from the next whole day on");
   command
       .addOption("--from", arguments->from,
-                 "The first day whose statistics may leave: today, yesterday, a number or "
+                 "The first day whose statistics may leave: today, yesterday, a day number or "
                  "YYYY-MM-DD, UTC")
       .typeName("DAY");
   command.setFooter(

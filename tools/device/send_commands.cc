@@ -151,7 +151,8 @@ void addSendCommands(Command app, ToolContext& context) {
   const Command forceCommand =
       group.addCommand("force", "Have the service run the daily tasks of a day");
   const auto day = std::make_shared<std::string>();
-  forceCommand.addOption("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD").required();
+  forceCommand.addOption("DAY", *day, "today, yesterday, a day number or YYYY-MM-DD, UTC")
+      .required();
   forceCommand.onRun([&context, day] { force(context, *day); });
 
   const Command deliverCommand = group.addCommand("deliver", "Deliver application information");

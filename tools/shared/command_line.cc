@@ -80,6 +80,20 @@ std::string usageFault(const CLI::App& app, const std::vector<std::string>& argu
   return format("%s: see '%s --help'", fault, line);
 }
 
+// The program and the subcommands that the arguments name.
+std::string commandOf(const CLI::App& app, const std::vector<std::string>& arguments) {
+  const CLI::App* command = &app;
+  std::string line = app.get_name();
+  for (const std::string& argument : arguments) {
+    const auto inner = command->get_subcommands(
+        [&argument](const CLI::App* below) { return below->get_name() == argument; });
+    if (argument.empty() || inner.empty()) continue;
+    command = inner.front();
+    line += ' ' + argument;
+  }
+  return line;
+}
+
 // The first option that ends in "=": CLI11 would take the next argument as its value.
 std::string emptyValueIn(const std::vector<std::string>& arguments) {
   for (const std::string& argument : arguments) {
@@ -96,7 +110,7 @@ std::string emptyValueIn(const std::vector<std::string>& arguments) {
 void runCommandLine(CLI::App& app, const std::vector<std::string>& arguments, ToolOutput& output) {
   if (const std::string option = emptyValueIn(arguments); !option.empty()) {
     return output.failUsage(
-        format("%s: must not be empty: see '%s --help'", option, app.get_name()));
+        format("%s: must not be empty: see '%s --help'", option, commandOf(app, arguments)));
   }
   try {
     app.parse(std::vector<std::string>(arguments.rbegin(), arguments.rend()));

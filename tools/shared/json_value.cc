@@ -73,9 +73,31 @@ bool isSpecial(std::string_view key) {
 
 // Builds values directly from the parser's events, so that numbers keep every digit and a document
 // that nests too deeply is refused before anything recurses over it.
+/// "not JSON at line 2, column 4: invalid literal", from "[TAG] parse error at line 2, column 4:
+/// syntax error while parsing value - invalid literal; last read: 'no'". The line is left out when
+/// there is only one, and other messages lose only their tag.
+std::string inOurWords(std::string_view words, bool isOneLine) {
+  const std::size_t tag = words.find("] ");
+  if (tag != std::string_view::npos) words.remove_prefix(tag + 2);
+  constexpr std::string_view kAt = "parse error at ";
+  constexpr std::string_view kFirstLine = "line 1, ";
+  constexpr std::string_view kDash = " - ";
+  const std::size_t colon = words.find(": ");
+  const std::size_t dash = words.find(kDash);
+  if (!words.starts_with(kAt) || colon > dash || dash == std::string_view::npos) {
+    return std::string(words);
+  }
+  std::string_view place = words.substr(kAt.size(), colon - kAt.size());
+  if (isOneLine && place.starts_with(kFirstLine)) place.remove_prefix(kFirstLine.size());
+  const std::string_view reason = words.substr(dash + kDash.size());
+  return format("not JSON at %s: %s", place, reason.substr(0, reason.find(';')));
+}
+
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
   plist::Value takeResult() { return std::move(result_); }
+  explicit ValueBuilder(bool isOneLine) : isOneLine_(isOneLine) {}
+
   const std::string& message() const { return message_; }
 
   bool null() override { return fail("a property list cannot contain null"); }
@@ -123,10 +145,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   }
 
   bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception& e) override {
-    // The parser's message begins with a tag in brackets.
-    const std::string_view text = e.what();
-    const std::size_t tag = text.find("] ");
-    message_ = text.substr(tag == std::string_view::npos ? 0 : tag + 2);
+    message_ = inOurWords(e.what(), isOneLine_);
     return false;
   }
 
@@ -180,6 +199,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
 
   std::vector<Level> levels_;
   plist::Value result_;
+  const bool isOneLine_;
   std::string message_;
   std::size_t count_ = 0;
 };
@@ -227,7 +247,7 @@ Json jsonOf(const plist::Value& value) {
 }
 
 Expected<plist::Value> parseJsonValue(std::string_view text) {
-  ValueBuilder builder;
+  ValueBuilder builder(text.find('\n') == std::string_view::npos);
   if (!nlohmann::json::sax_parse(text.begin(), text.end(), &builder)) {
     return Error{shortened(builder.message())};
   }

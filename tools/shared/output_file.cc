@@ -32,7 +32,7 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
   const auto folder = path.parent_path().string();
   if (!FileSystem::status(folder)) {
     const std::string reason = systemText(errno);
-    return Error{format("cannot write %s: %s: %s", file, folder, reason)};
+    return Error{format("cannot write %s: %s: %s: create this folder", file, folder, reason)};
   }
   return FileSystem().replace(path.string(), asBytes(bytes), 0644);
 }

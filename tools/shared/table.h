@@ -56,9 +56,9 @@ class Table {
   bool empty() const { return rows_.empty(); }
 
   /// On a terminal, leaves out ranked columns until the table fits, says so in a line below it, and
-  /// then cuts the widest column of left-aligned text ("…"). Elsewhere all columns appear, cells
-  /// are whole, and long ones push the rest of their row to the right. Bars take the remaining
-  /// width. Titles are not printed when all are empty.
+  /// then cuts the widest column of left-aligned text ("…") if the table then fits. Elsewhere all
+  /// columns appear, cells are whole, and long ones push the rest of their row to the right. Bars
+  /// take the remaining width. Titles are not printed when all are empty.
   void print(const Page& page);
 
  private:
