@@ -231,18 +231,18 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
 TEST_F(ReportTest, RegistryListsShowsAndRecords) {
   device.check(
       "registry list",
-      prints("        ID  CLASS                   NAME         PUBLIC  CHANNELS  METHODS\n"
-             "4294967296  ExampleRoot             root         no             0        0\n"
-             "4294967809  ExampleFlashController  flash0       yes            6        0\n"
-             "4294967810  ExampleRadio            radio0       yes            5        0\n"
-             "4294967811  ExampleSensor           sensor0      no             1        0\n"
-             "4294967300  IOReportHub             IOReportHub  no             0        0\n"));
+      prints("         ID  CLASS                   NAME         PUBLIC  CHANNELS  METHODS\n"
+             "0x100000000  ExampleRoot             root         no             0        0\n"
+             "0x100000201  ExampleFlashController  flash0       yes            6        0\n"
+             "0x100000202  ExampleRadio            radio0       yes            5        0\n"
+             "0x100000203  ExampleSensor           sensor0      no             1        0\n"
+             "0x100000004  IOReportHub             IOReportHub  no             0        0\n"));
   device.check(
       "registry show 0x100000000",
       prints("Class = \"ExampleRoot\"\nEntryID = 4294967296\nName = \"root\"\nParents = {}\n"
              "Properties:\n  model = \"Example board\"\n"));
   device.check("registry show 9",
-               fails("no service has entry id 9: 'tavrelctl registry list' shows what there is"));
+               fails("no service has entry id 0x9: 'tavrelctl registry list' shows what there is"));
   device.check("registry show flash0",
                fails("not an entry id: flash0: give a 64-bit number, decimal or with 0x", 2));
 

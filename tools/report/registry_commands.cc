@@ -106,7 +106,7 @@ void list(ToolContext& context, const Arguments&) {
                           {"channels", channelCount(service)},
                           {"methods", methods}});
     } else {
-      table.add({id ? std::to_string(*id) : "-", std::string(className), std::string(name),
+      table.add({id ? format("%#llx", *id) : "-", std::string(className), std::string(name),
                  isPublic ? "yes" : "no", std::to_string(channelCount(service)),
                  std::to_string(methods)});
     }
@@ -134,7 +134,7 @@ void show(ToolContext& context, const Arguments& arguments) {
     return printOutline(context.out(), service);
   }
   context.fail(
-      format("no service has entry id %llu: 'tavrelctl registry list' shows what there is", *id));
+      format("no service has entry id %#llx: 'tavrelctl registry list' shows what there is", *id));
 }
 
 void record(ToolContext& context, const Arguments& arguments) {

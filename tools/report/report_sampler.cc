@@ -34,7 +34,8 @@ Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
   }
   if (IOReportGetChannelCount(*selected) == 0) {
     context.fail(selection.isEmpty()
-                     ? format("no channels: recordings of drivers belong in %s", kRecordingFolder)
+                     ? format("no channels: recordings of drivers belong in %s",
+                              context.root().path(kRecordingFolder))
                      : std::string("no channel matches: 'tavrelctl report list' shows all"));
     return;
   }
