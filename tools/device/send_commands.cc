@@ -14,6 +14,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
+#include "platform/linux/service/service_socket.h"
 #include "platform/persisted_state.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
