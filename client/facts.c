@@ -54,7 +54,7 @@ static uint64_t startTime(void) {
 }
 
 static void makeIdentity(unsigned char identity[16]) {
-  if (getrandom(identity, 16, GRND_NONBLOCK) == 16) return;
+  if (syscall(SYS_getrandom, identity, 16, GRND_NONBLOCK) == 16) return;
   /* No random bytes yet, early after boot. The identity need only be unique per user. */
   struct timespec now = {0};
   clock_gettime(CLOCK_BOOTTIME, &now);

@@ -6,6 +6,7 @@
 #include <cstring>
 #include <dlfcn.h>
 #include <grp.h>
+#include <pthread.h>
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/time.h>
@@ -349,6 +350,29 @@ TEST_F(Recording, AProcessThatChangesItsRootFolderGoesOn) {
   });
   fold();
   EXPECT_EQ(records["series"], (std::vector<double>{1, 2}));
+}
+
+TEST_F(Recording, AThreadIsNotCancelledInItsFirstValue) {
+  run([] {
+    keys();
+    pthread_t thread;
+    const auto recordAndEnd = [](void*) -> void* {
+      pthread_cancel(pthread_self());  // takes effect at the next cancellation point
+      add(1);
+      set(2);
+      record(3);
+      BHClientGetStatus(nullptr);
+      pthread_testcancel();
+      return nullptr;
+    };
+    ASSERT_EQ(pthread_create(&thread, nullptr, recordAndEnd, nullptr), 0);
+    void* result = nullptr;
+    ASSERT_EQ(pthread_join(thread, &result), 0);
+    EXPECT_EQ(result, PTHREAD_CANCELED);
+  });
+  fold();
+  EXPECT_EQ(scalars, (Scalars{{{"count", kToday}, 1}, {{"gauge", kToday}, 2}}));
+  EXPECT_EQ(records["series"], std::vector<double>{3});
 }
 
 TEST_F(Recording, AFullFileSystemDropsAndCounts) {
