@@ -17,8 +17,10 @@ void checkLine(std::string_view text) {
   if (tavrel::parseStatsdLine(text, line) != tavrel::StatsdParse::Good) return;
   require(!line.name.empty() && text.starts_with(line.name));
   require(!line.values.empty() && line.values.size() <= text.size());
-  for (const double value : line.values)
-    require(std::isfinite(value));
+  for (const tavrel::StatsdValue& value : line.values) {
+    require(std::isfinite(value.number));
+    require(!value.whole || static_cast<double>(*value.whole) == value.number);
+  }
   require(line.rate > 0 && line.rate <= 1);
 
   std::string key;

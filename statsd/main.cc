@@ -1,11 +1,13 @@
 // tavrel-statsd: records what programs send as StatsD datagrams.
 #include <cerrno>
+#include <chrono>
 #include <cstdio>
 #include <cstdlib>
 #include <getopt.h>
 #include <string>
 #include <string_view>
 #include <unistd.h>
+#include <utility>
 #include <vector>
 
 #include "base/format.h"
@@ -13,6 +15,7 @@
 #include "base/program.h"
 #include "base/system_text.h"
 #include "base/version.h"
+#include "statsd/recording_watch.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
 
@@ -137,18 +140,30 @@ int run(int argc, char** argv) {
     return 1;
   }
   StatsdRecorder recorder(options.prefix);
-  // Datagrams are taken anyway: the library tries again while the program runs.
-  const char* why = nullptr;
-  if (BHClientGetStatus(&why) != BHClientStatusRecording) complain(why);
+  // Datagrams are taken even when they cannot be recorded: the library tries again.
+  RecordingWatch watch(complain);
+  Status done = watch.look();
+  bool isOutOfKeys = false;
+  const auto pause = [&] {
+    if (recorder.isOutOfKeys() && !std::exchange(isOutOfKeys, true)) {
+      complain(
+          "no room for further keys: lines with new names are refused until the program starts "
+          "again: keep what varies, such as an id, out of names");
+    }
+    return watch.lookAt(std::chrono::steady_clock::now());
+  };
 
   std::optional<std::chrono::milliseconds> idle;
   if (options.idleSeconds > 0) idle = std::chrono::seconds(options.idleSeconds);
-  const Status received =
-      receiveDatagrams(*sockets, idle,
-                       {.take = [&](std::string_view datagram) { recorder.take(datagram); },
-                        .dropTooLong = [&] { recorder.count(StatsdFault::TooLong); }});
-  if (received) return 0;
-  complain(received.error().message);
+  if (done) {
+    done = receiveDatagrams(*sockets, idle,
+                            {.take = [&](std::string_view datagram) { recorder.take(datagram); },
+                             .dropTooLong = [&] { recorder.count(StatsdFault::TooLong); },
+                             .pause = pause});
+  }
+  if (done) done = watch.look();
+  if (done) return 0;
+  complain(done.error().message);
   return 1;
 }
 

@@ -14,26 +14,40 @@ std::string_view takeUntil(std::string_view& rest, char end) {
   return part;
 }
 
-bool parseFinite(std::string_view text, double& number) {
-  if (text.starts_with('+')) {
-    text.remove_prefix(1);
-    if (text.starts_with('-')) return false;
-  }
-  const auto value = parseNumber<double>(text);
-  if (!value || !std::isfinite(*value)) return false;
-  number = *value;
-  return true;
+// Nothing when two signs follow each other.
+std::optional<std::string_view> withoutPlus(std::string_view text) {
+  if (!text.starts_with('+')) return text;
+  text.remove_prefix(1);
+  if (text.starts_with('-')) return std::nullopt;
+  return text;
 }
 
-// Whether a value of the line can be added to a scalar, or set.
-bool isInRange(const StatsdLine& line, double value) {
-  if (line.kind == StatsdKind::Series) return true;
-  if (line.kind == StatsdKind::Counter) value /= line.rate;
-  return value >= -0x1p63 && value < 0x1p63;
+std::optional<double> parseFinite(std::string_view text) {
+  const auto digits = withoutPlus(text);
+  const auto number = digits ? parseNumber<double>(*digits) : std::nullopt;
+  return number && std::isfinite(*number) ? number : std::nullopt;
+}
+
+std::optional<StatsdValue> parseValue(std::string_view text, const StatsdLine& line) {
+  const bool isScalar = line.kind != StatsdKind::Series;
+  const double rate = line.kind == StatsdKind::Counter ? line.rate : 1;
+  if (isScalar && rate == 1) {
+    const auto digits = withoutPlus(text);
+    const auto whole = digits ? parseNumber<std::int64_t>(*digits) : std::nullopt;
+    if (whole) return StatsdValue{static_cast<double>(*whole), whole};
+  }
+  const auto number = parseFinite(text);
+  if (!number) return std::nullopt;
+  const double recorded = *number / rate;
+  if (isScalar && !(recorded >= -0x1p63 && recorded < 0x1p63)) return std::nullopt;
+  return StatsdValue{*number, std::nullopt};
 }
 
 bool parseRate(std::string_view text, double& rate) {
-  return parseFinite(text, rate) && rate > 0 && rate <= 1;
+  const auto number = parseFinite(text);
+  if (!number || !(*number > 0 && *number <= 1)) return false;
+  rate = *number;
+  return true;
 }
 
 // Fields for tags, the sender's container or its time.
@@ -78,10 +92,9 @@ StatsdParse parseStatsdLine(std::string_view text, StatsdLine& result) {
 
   result.values.clear();
   do {
-    double value = 0;
-    if (!parseFinite(takeUntil(values, ':'), value) || !isInRange(result, value))
-      return StatsdParse::Malformed;
-    result.values.push_back(value);
+    const auto value = parseValue(takeUntil(values, ':'), result);
+    if (!value) return StatsdParse::Malformed;
+    result.values.push_back(*value);
   } while (!values.empty());
   const bool isGauge = result.kind == StatsdKind::Gauge || result.kind == StatsdKind::GaugeDelta;
   return isGauge && result.values.size() > 1 ? StatsdParse::Malformed : StatsdParse::Good;

@@ -5,6 +5,7 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string_view>
 #include <vector>
 
@@ -23,13 +24,20 @@ enum class StatsdParse : std::uint8_t {
   Unsupported,  // a set, an event or a service check
 };
 
+struct StatsdValue {
+  /// Finite; that of a scalar fits 64 bits, also divided by the rate.
+  double number;
+  /// What a scalar's whole number is exactly, where no rate divides it: above 2^53, `number` is
+  /// rounded.
+  std::optional<std::int64_t> whole;
+};
+
 struct StatsdLine {
   /// Not empty, and without tags. Points into the parsed line.
   std::string_view name;
   StatsdKind kind;
-  /// One or more, all finite; those of scalars fit 64 bits, also divided by the rate. Gauges have
-  /// one.
-  std::vector<double> values;
+  /// One or more; gauges have one.
+  std::vector<StatsdValue> values;
   /// The fraction of all events that the client sent, above 0 and at most 1.
   double rate;
 };

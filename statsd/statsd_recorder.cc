@@ -22,6 +22,13 @@ constexpr bool isKeyCharacter(char character) {
   return isLetterOrDigit(character) || character == '.' || character == '_' || character == '-';
 }
 
+// Some clients end lines with "\r\n".
+std::string_view withoutBlanksAtEnd(std::string_view line) {
+  while (line.ends_with(' ') || line.ends_with('\t') || line.ends_with('\r'))
+    line.remove_suffix(1);
+  return line;
+}
+
 // Returns the whole part of `value` and keeps the rest in `remainder`. A sum that lies only a
 // rounding error below a whole number, as ten times 0.1 may, counts as that number.
 std::int64_t takeWhole(double value, double& remainder) {
@@ -56,7 +63,8 @@ StatsdRecorder::StatsdRecorder(std::string prefix)
 void StatsdRecorder::take(std::string_view datagram) {
   while (!datagram.empty()) {
     const std::size_t end = std::min(datagram.find('\n'), datagram.size());
-    if (end > 0) takeLine(datagram.substr(0, end));
+    if (const auto line = withoutBlanksAtEnd(datagram.substr(0, end)); !line.empty())
+      takeLine(line);
     datagram.remove_prefix(std::min(end + 1, datagram.size()));
   }
 }
@@ -81,22 +89,24 @@ bool StatsdRecorder::record(const StatsdLine& line) {
   Key* const key = find(line.kind == StatsdKind::Series ? series_ : scalars_, line.name);
   if (key == nullptr) return false;
   const double mostCopies = std::max(1.0, kMostCopies / static_cast<double>(line.values.size()));
-  for (const double value : line.values) {
+  const double rate = line.kind == StatsdKind::Counter ? line.rate : 1;
+  const auto wholeOf = [&](const StatsdValue& value) {
+    return value.whole ? *value.whole : takeWhole(value.number / rate, key->remainder);
+  };
+  for (const StatsdValue& value : line.values) {
     switch (line.kind) {
       case StatsdKind::Counter:
-        BHClientScalarAdd(key->scalar, takeWhole(value / line.rate, key->remainder));
-        break;
       case StatsdKind::GaugeDelta:
-        BHClientScalarAdd(key->scalar, takeWhole(value, key->remainder));
+        BHClientScalarAdd(key->scalar, wholeOf(value));
         break;
       case StatsdKind::Gauge:
         key->remainder = 0;
-        BHClientScalarSet(key->scalar, takeWhole(value, key->remainder));
+        BHClientScalarSet(key->scalar, wholeOf(value));
         break;
       case StatsdKind::Series: {
         const double copies = std::min(1 / line.rate, mostCopies);
         for (std::int64_t left = takeWhole(copies, key->remainder); left > 0; --left)
-          BHClientDistributionRecord(key->series, value);
+          BHClientDistributionRecord(key->series, value.number);
         break;
       }
     }
@@ -111,7 +121,10 @@ StatsdRecorder::Key* StatsdRecorder::find(Keys& keys, std::string_view name) {
   appendStatsdKey(name_, name);
   if (const auto known = keys.find(std::string_view(name_)); known != keys.end())
     return &known->second;
-  if (keysLeft_ == 0 || nameBytesLeft_ < name_.size()) return nullptr;
+  if (keysLeft_ == 0 || nameBytesLeft_ < name_.size()) {
+    isOutOfKeys_ = true;
+    return nullptr;
+  }
   --keysLeft_;
   nameBytesLeft_ -= name_.size();
   Key key;

@@ -34,6 +34,8 @@ class StatsdRecorder {
   void take(std::string_view datagram);
   /// Counts something that was not recorded.
   void count(StatsdFault fault) const;
+  /// Whether a line was refused because the keys of this process have no room for its own.
+  bool isOutOfKeys() const { return isOutOfKeys_; }
 
  private:
   struct Key {
@@ -60,6 +62,7 @@ class StatsdRecorder {
   Keys series_;
   std::size_t keysLeft_;
   std::size_t nameBytesLeft_;
+  bool isOutOfKeys_ = false;
   std::array<BHClientScalarKey*, 4> faults_;
 };
 

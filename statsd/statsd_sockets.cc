@@ -187,6 +187,7 @@ Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
       if (count < 0) return failure("cannot receive datagrams");
       batch.hand(count, handlers);
     }
+    if (Status goesOn = handlers.pause(); !goesOn) return goesOn;
   }
 }
 

@@ -47,10 +47,12 @@ struct DatagramHandlers {
   std::function<void(std::string_view datagram)> take;
   /// Called when a datagram was longer than `kLongestDatagram` and is lost.
   std::function<void()> dropTooLong;
+  /// Called after some datagrams; an error ends the reception.
+  std::function<Status()> pause;
 };
 
 /// Receives until no datagram has arrived for `idle`, or for ever without it. An
-/// error when a socket fails.
+/// error when a socket fails, or that of `pause`.
 Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
                         std::optional<std::chrono::milliseconds> idle,
                         const DatagramHandlers& handlers);

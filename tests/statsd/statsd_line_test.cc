@@ -21,8 +21,10 @@ std::string parsed(std::string_view text) {
   constexpr const char* kKinds[] = {"counter", "gauge", "delta", "series"};
   std::ostringstream out;
   out << line.name << " " << kKinds[static_cast<int>(line.kind)];
-  for (const double value : line.values)
-    out << " " << value;
+  for (const StatsdValue& value : line.values) {
+    out << " ";
+    value.whole ? out << *value.whole : out << value.number;
+  }
   if (line.rate != 1) out << " @" << line.rate;
   return out.str();
 }
@@ -66,7 +68,15 @@ TEST(StatsdLine, IsParsedWithinItsBounds) {
       {"a:inf|ms", "malformed"},
       {"a:1e999|c", "malformed"},
       {"a:9223372036854775808|c", "malformed"},
-      {"a:-9223372036854775808|c", "a counter -9.22337e+18"},
+      {"a:9223372036854775808|g", "malformed"},
+      {"a:-9223372036854775808|c", "a counter -9223372036854775808"},
+      {"a:9223372036854775807|g|@0.5", "a gauge 9223372036854775807 @0.5"},
+      {"a:+9007199254740993|g", "a delta 9007199254740993"},
+      {"a:1:-9007199254740993:0.5|c", "a counter 1 -9007199254740993 0.5"},
+      {"a:9007199254740993|c|@0.5", "a counter 9.0072e+15 @0.5"},
+      {"a:9007199254740993|ms", "a series 9.0072e+15"},
+      {"a:9223372036854775807|c|@0.5", "malformed"},
+      {"a:++1|g", "malformed"},
       {"a:1e18|c|@0.1", "malformed"},
       {"a:1e18|g|@0.1", "a gauge 1e+18 @0.1"},
       {"a:1:-1e30|c", "malformed"},

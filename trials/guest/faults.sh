@@ -175,7 +175,9 @@ tavrel: active success 0
 tavrel-sampler: activating exit-code 1
   tavrelctl: cannot record in /run/tavrel/stat: memory or a limit of this process is exhausted: run \
 'tavrelctl stat fold' or free space in /run
-tavrel-statsd: active success 0" \
+tavrel-statsd: active success 0
+  tavrel-statsd: the tmpfs of /run/tavrel/stat, or a limit of the process, is exhausted: nothing is \
+recorded" \
   "$(outcomes)"
 # shellcheck disable=SC2086
 uncover $folders

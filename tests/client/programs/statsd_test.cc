@@ -3,6 +3,7 @@
 #include <sys/socket.h>
 #include <sys/un.h>
 
+#include "statsd/recording_watch.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
 #include "tests/client/recording.h"
@@ -52,6 +53,8 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
       recorder.take("tenths:0.1|c");
     recorder.take("level:3.9|g\nlevel:7.5|g\nlevel:+0.75|g\nlevel:-2|g");
     recorder.take("time:3.5|ms\ntime:4|h|@0.5\ntime:5|d|@0.00001");
+    recorder.take("whole:9007199254740992|c\nwhole:0.5|c\r\nwhole:1|c \t\r\n\r\nwhole:0.5|c");
+    recorder.take("nanoseconds:0.5|g\nnanoseconds:1795775475123456789|g\r");
     recorder.take("time:6:6:6:6|ms|@0.001");
     std::string many = "time:7";
     for (int i = 1; i < 1500; ++i)
@@ -68,6 +71,8 @@ TEST_F(Statsd, RecordsWhatLinesSay) {
                          {{"s.tenths", kToday}, 1},
                          {{"s.level", kToday}, 6},
                          {{"s.time", kToday}, 9},
+                         {{"s.whole", kToday}, 9'007'199'254'740'994},
+                         {{"s.nanoseconds", kToday}, 1'795'775'475'123'456'789},
                          {{"s.tavrel-statsd.malformed", kToday}, 1},
                          {{"s.tavrel-statsd.unsupported", kToday}, 1},
                          {{"s.tavrel-statsd.refused", kToday}, 1},
@@ -86,6 +91,7 @@ TEST_F(Statsd, CountsLinesOfKeysBeyondTheLimits) {
     for (int round = 0; round < 2; ++round)
       for (int i = 0; i < kBHKeys; ++i)
         recorder.take(std::to_string(i) + ":1|c");
+    EXPECT_TRUE(recorder.isOutOfKeys());
   });
   run([] {
     StatsdRecorder recorder("");
@@ -183,6 +189,29 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
       "in the socket unit\n");
   kill(child, SIGTERM);
   EXPECT_EQ(waitFor(child), SIGTERM);
+}
+
+TEST_F(Statsd, EndsWhenItsFileIsRemoved) {
+  const std::string removed =
+      "the process's file in /run/tavrel/stat has been removed: values are lost until the process "
+      "is restarted";
+  run([&] {
+    RecordingWatch watch([](std::string_view why) { FAIL() << why; });
+    RecordingWatch::Ticks now{};
+    EXPECT_TRUE(watch.lookAt(now));
+    std::filesystem::remove(folder / segments().front());
+    EXPECT_TRUE(watch.lookAt(now += std::chrono::seconds(59)));
+    EXPECT_EQ(watch.lookAt(now += std::chrono::seconds(1)).error().message, removed);
+  });
+  const std::string program = kProgram + " --idle 1 --unix " + (root / "own.sock").string();
+  EXPECT_EQ(outputOf("exec 2>&1; timeout 60 " + program + " & until rm " + folder.string() +
+                         "/*.segment; do :; done 2>/dev/null; wait $!",
+                     1),
+            "tavrel-statsd: " + removed + "\n");
+  std::filesystem::remove(folder);
+  EXPECT_EQ(outputOf(program),
+            "tavrel-statsd: the device has no folder /run/tavrel/stat: nothing is recorded\n")
+      << "once";
 }
 
 TEST(StatsdSockets, SayWhatTheyCannotDo) {
