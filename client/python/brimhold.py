@@ -22,6 +22,8 @@ After `os.fork` the child records for itself. Calls may come from any thread.
 
 from __future__ import annotations
 
+import collections.abc
+import contextlib
 import ctypes
 import enum
 import functools
@@ -82,10 +84,14 @@ def status() -> tuple[Status, str]:
     """The status, and a sentence about it. Starts recording if necessary."""
     text = ctypes.c_char_p()
     number = _library.BHClientGetStatus(ctypes.byref(text))
-    return Status(number), (text.value or b"").decode()
+    # A newer library may have more.
+    known = Status(number) if number in list(Status) else Status.FAILED
+    return known, (text.value or b"").decode()
 
 
 def _key(key: str) -> bytes:
+    if not isinstance(key, str):
+        raise TypeError("a key is a str")
     encoded = key.encode()
     if not encoded:
         raise ValueError("a key is empty")
@@ -112,6 +118,9 @@ class Scalar:
         self.key = key
         self._handle = _library.BHClientScalarForKey(_key(key))
 
+    def __reduce__(self) -> tuple[typing.Any, ...]:
+        return type(self), (self.key,)  # the handle is an address in this process
+
     def add(self, amount: typing.SupportsIndex = 1) -> None:
         """Adds to today's value, which starts at 0."""
         _library.BHClientScalarAdd(self._handle, _integer(amount))
@@ -129,6 +138,9 @@ class Distribution:
     def __init__(self, key: str) -> None:
         self.key = key
         self._handle = _library.BHClientDistributionForKey(_key(key))
+
+    def __reduce__(self) -> tuple[typing.Any, ...]:
+        return type(self), (self.key,)  # the handle is an address in this process
 
     def record(self, value: float) -> None:
         """Appends a measurement."""
@@ -155,7 +167,8 @@ class Timer:
         def work(): ...
 
     A timer measures one block at a time: make one for each block. It measures any number of calls
-    of a function, or of a coroutine until it returns, but no generator.
+    of a function, or of a coroutine until it returns, but no generator and no context manager made
+    from one.
     """
 
     __slots__ = ("_distribution", "_milliseconds", "_started")
@@ -177,31 +190,61 @@ class Timer:
         error: BaseException | None,
         traceback: TracebackType | None,
     ) -> None:
-        stop = (
-            _library.BHClientTimerStopMilliseconds
-            if self._milliseconds
-            else _library.BHClientTimerStopSeconds
-        )
         started, self._started = self._started, None
-        stop(started, self._distribution._handle)
+        self._record(started)
+
+    def __reduce__(self) -> tuple[typing.Any, ...]:
+        if self._started is not None:
+            raise TypeError("a timer cannot be pickled or copied while it measures")
+        make = functools.partial(type(self), milliseconds=self._milliseconds)
+        return make, (self._distribution,)
 
     def __call__(self, function: typing.Callable[..., typing.Any]) -> typing.Callable[..., typing.Any]:
         import inspect  # only here, since it takes milliseconds
 
         if inspect.isgeneratorfunction(function) or inspect.isasyncgenfunction(function):
-            raise TypeError("a timer measures no generator: use it in a with statement")
+            raise TypeError(_NO_GENERATOR)
 
-        def timer() -> Timer:
-            return Timer(self._distribution, milliseconds=self._milliseconds)
+        async def result_of(coroutine: typing.Awaitable[typing.Any]) -> typing.Any:
+            with Timer(self._distribution, milliseconds=self._milliseconds):
+                return await coroutine
 
         @functools.wraps(function)
         async def timed_coroutine(*arguments: typing.Any, **named: typing.Any) -> typing.Any:
-            with timer():
-                return await function(*arguments, **named)
+            return await result_of(function(*arguments, **named))
 
         @functools.wraps(function)
         def timed(*arguments: typing.Any, **named: typing.Any) -> typing.Any:
-            with timer():
-                return function(*arguments, **named)
+            started = _library.BHClientTimerStart()
+            try:
+                result = function(*arguments, **named)
+            except BaseException:
+                self._record(started)
+                raise
+            # Not each function that returns one of these is known by its own kind.
+            if isinstance(result, collections.abc.Coroutine):
+                return result_of(result)
+            if isinstance(result, _GENERATORS):
+                raise TypeError(_NO_GENERATOR)
+            self._record(started)
+            return result
 
         return timed_coroutine if inspect.iscoroutinefunction(function) else timed
+
+    def _record(self, started: _Timer) -> None:
+        stop = (
+            _library.BHClientTimerStopMilliseconds
+            if self._milliseconds
+            else _library.BHClientTimerStopSeconds
+        )
+        stop(started, self._distribution._handle)
+
+
+_NO_GENERATOR = "a timer measures no generator: use it in a with statement"
+_GENERATORS = (
+    collections.abc.Generator,
+    collections.abc.AsyncGenerator,
+    # What these two make has no public name.
+    type(contextlib.contextmanager(lambda: iter(()))()),
+    type(contextlib.asynccontextmanager(lambda: None)()),  # type: ignore[arg-type,return-value]
+)

@@ -146,7 +146,8 @@ TEST_F(Programs, AForkedChildThatExecutesRecordsForItself) {
 
 TEST_F(Programs, PythonRecords) {
   const std::string program = R"(
-import asyncio, brimhold, inspect, os
+import asyncio, brimhold, contextlib, functools, inspect, os, pickle
+import subprocess, sys
 count, gauge = brimhold.Scalar('py.count'), brimhold.Scalar('py.gauge')
 series, timed = brimhold.Distribution('py.series'), brimhold.Distribution('py.timed')
 count.add(); count.add(True); gauge.set(-2**63); series.record(1)
@@ -159,32 +160,60 @@ except KeyError: print(double(4), double.__name__)
 @timed.timer()
 async def later(): return 9
 print(inspect.iscoroutinefunction(later), asyncio.run(later()))
+# Neither looks like a coroutine function.
+hidden = brimhold.Distribution('py.hidden')
+class Waits:
+    async def __call__(self): await asyncio.sleep(.01); return 1
+def passed_on(function):
+    @functools.wraps(function)
+    def call(): return function()
+    return call
+print([asyncio.run(hidden.timer()(waits)()) for waits in (Waits(), passed_on(Waits().__call__))])
 one = timed.timer()
 def nest():
     with one, one: pass
 def numbers(): yield 1
 async def signals(): yield 1
+def pickled_while_it_runs():
+    running = brimhold.Distribution('py.none').timer()
+    running.__enter__()
+    pickle.dumps(running)
+lazy = [passed_on(numbers), passed_on(signals),
+        contextlib.contextmanager(numbers), contextlib.asynccontextmanager(signals)]
 for wrong in (lambda: count.add(2**63), lambda: count.add(1.5), lambda: series.record('x'),
               lambda: count.add(10**5000), lambda: series.record(10**400),
-              nest, lambda: one(numbers), lambda: one(signals),
+              nest, lambda: one(numbers), lambda: one(signals), *map(one, lazy),
+              pickled_while_it_runs, lambda: brimhold.Scalar(b'a'), lambda: brimhold.Scalar(None),
               lambda: brimhold.Scalar(''), lambda: brimhold.Scalar('a\n'),
               lambda: brimhold.Distribution('ü' * 513)):
     try: wrong()
-    except Exception as error: print(type(error).__name__)
+    except Exception as error: print(type(error).__name__, end=' ')
 print(brimhold.status(), flush=True)
-if os.fork() == 0: count.add(40)
+if os.fork() == 0: count.add(30)
 else: os.wait()
+# In another process, the addresses of this one mean nothing.
+subprocess.run([sys.executable, '-B', '-c', """
+import brimhold, pickle, sys
+brimhold.Scalar('py.other').add()
+scalar, record, timer = pickle.load(sys.stdin.buffer)
+scalar.add(10); record(2)
+with timer: pass
+"""], input=pickle.dumps((count, series.record, timed.timer(milliseconds=True))), check=True)
 )";
   setenv("PROGRAM", program.c_str(), 1);
   EXPECT_EQ(outputOf(kPython + "PYTHONPATH=" TAVREL_SOURCE "/client/python "
                                "BRIMHOLD_LIBRARY=" TAVREL_BUILD "/client/libbrimhold.so.1 "
                                "python3 -B -c \"$PROGRAM\""),
-            "8 double\nTrue 9\nOverflowError\nTypeError\nTypeError\nOverflowError\nOverflowError\n"
-            "RuntimeError\nTypeError\nTypeError\nValueError\nValueError\nValueError\n"
-            "(<Status.RECORDING: 0>, 'values are recorded')\n");
-  EXPECT_EQ(foldedScalars(), "py.count=42 py.gauge=-9223372036854775808 ");
-  EXPECT_EQ(records["py.series"], std::vector<double>{1});
-  EXPECT_EQ(records["py.timed"].size(), 5U);
+            "8 double\nTrue 9\n[1, 1]\n"
+            "OverflowError TypeError TypeError OverflowError OverflowError RuntimeError TypeError "
+            "TypeError TypeError TypeError TypeError TypeError TypeError TypeError TypeError "
+            "ValueError ValueError ValueError (<Status.RECORDING: 0>, 'values are recorded')\n");
+  EXPECT_EQ(foldedScalars(), "py.count=42 py.gauge=-9223372036854775808 py.other=1 ");
+  EXPECT_EQ(records["py.series"], (std::vector<double>{1, 2}));
+  EXPECT_EQ(records["py.timed"].size(), 6U);
+  ASSERT_EQ(records["py.hidden"].size(), 2U);
+  for (const double seconds : records["py.hidden"])
+    EXPECT_GE(seconds, 0.01);
 }
 
 }  // namespace
