@@ -38,17 +38,17 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   const auto file = root / "etc/tavrel/recorders.plist";
   const std::string recorders = R"(<?xml version="1.0" encoding="UTF-8"?><plist version="1.0"><dict>
 <key>12</key><array><string>com.a.</string><string>com.norvane.a.</string><string>com</string></array>
-<key>13</key><array><string>com.a.b.</string></array><key>nobody-here</key><array/>
+<key>13</key><array><string>com.a.b.</string></array><key>nobody-here</key><array><string>y</string></array>
 <key>14</key><string>com.</string></dict></plist>)";
-  const Lines keys{"com.a.x", "com.a.b.x", "com.norvane.a.x", "com.norvane.b", "com.b", "x"};
+  const Lines keys{"com.a.x", "com.a.b.x", "com.norvane.a.x", "com.norvane.b", "com.b", "x", "y"};
   const std::tuple<std::string, unsigned, uid_t, Lines, std::size_t> cases[] = {
       {recorders, 0644, 0, keys, 2},
       {recorders, 0644, 12, {"com.a.x", "com.b", "com.norvane.a.x"}, 3},
       {recorders, 0644, 13, {"com.a.b.x"}, 3},
       {recorders, 0644, 15, {"x"}, 3},
-      {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
-      {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},
-      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x"}, 2},  // a dangling link
+      {recorders, 0664, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},
+      {"<plist", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},
+      {"", 0644, 15, {"com.a.b.x", "com.a.x", "com.b", "x", "y"}, 2},  // a dangling link
   };
   for (const auto& [content, mode, user, allowed, lines] : cases) {
     SCOPED_TRACE(user);

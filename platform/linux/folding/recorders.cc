@@ -66,23 +66,29 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
 
 void Recorders::add(std::string_view user, const plist::Value& prefixes, const std::string& path,
                     SystemLog& log) {
-  const auto refuse = [&](std::string_view reason) {
+  const auto complain = [&](std::string_view what) {
     std::string shown;
     appendQuoted(shown, user.substr(0, 60));
-    log.log(LogLevel::Error, "%s: the entry %s is ignored: %s", path, shown, reason);
+    log.log(LogLevel::Error, "%s: the entry %s %s", path, shown, what);
   };
-  const auto number = userNumber(user);
-  if (!number) return refuse("there is no such user");
   const plist::Array array = prefixes.array();
-  if (!array) return refuse("give an array of prefixes");
+  if (!array) return complain("is ignored: give an array of prefixes");
   const bool areGood = std::all_of(array.begin(), array.end(), [](const plist::Value& prefix) {
     const auto text = prefix.string();
     return text && !text->empty() && text->size() <= kBHLongestName;
   });
-  if (!areGood) return refuse("a prefix is a text of 1 to 1024 bytes");
-  listed_.insert(*number);
-  for (const plist::Value& prefix : array)
-    users_[std::string(*prefix.string())].insert(*number);
+  if (!areGood) return complain("is ignored: a prefix is a text of 1 to 1024 bytes");
+  // Some users exist only while their service runs. In between, nobody may take their keys.
+  const auto number = userNumber(user);
+  if (number) {
+    listed_.insert(*number);
+  } else {
+    complain("names no user of this machine: until it does, only root may record its keys");
+  }
+  for (const plist::Value& prefix : array) {
+    auto& users = users_[std::string(*prefix.string())];
+    if (number) users.insert(*number);
+  }
 }
 
 Recorders::Users::const_iterator Recorders::longestPrefixOf(std::string_view key) const {

@@ -4,7 +4,9 @@
 // an array of prefixes.
 //
 //  - Root records any key.
-//  - Of the listed prefixes of a key, the longest decides: only its users may record the key.
+//  - Of the listed prefixes of a key, the longest decides: only its users may record the key. A
+//  user
+//    that does not exist reserves prefixes, too.
 //  - Anybody may record a key without a listed prefix, except listed users, who keep to theirs.
 //  - Keys that begin with "com.norvane." are the system's: a user needs a listed prefix that begins
 //    with it.
@@ -32,9 +34,9 @@ class Recorders {
   /// With no user listed.
   Recorders() = default;
 
-  /// Reads `kRecordersFile`. A file that is damaged, that users other than root and this
-  /// user could have written, or that is a dangling link counts as absent, with a line in the log;
-  /// so does each entry that is not understood.
+  /// Reads `kRecordersFile`. A file that is damaged, that users other than root and this user could
+  /// have written, or that is a dangling link counts as absent, and so does an entry without an
+  /// array of prefixes. Each of these, and each user that does not exist, is a line in the log.
   static Recorders read(const DeviceRoot& root, FileSystem& files,
                         PropertyListCoding& propertyLists, SystemLog& log);
 
