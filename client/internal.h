@@ -58,6 +58,8 @@ void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segmen
 /* Whether the segment's file, or its folder, has been removed. Not known, and false, in a process
  * that has changed its root folder. */
 bool bhWasRemoved(const char* folder, struct SegmentName name);
+/* Whether the process could create the file that asks for a fold. */
+bool bhMayAskForFold(const char* folder);
 /* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);

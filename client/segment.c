@@ -109,6 +109,10 @@ static const char* textOf(BHClientStatus status) {
     case BHClientStatusRemoved:
       return "the process's file in /run/tavrel/stat has been removed: values are lost until the "
              "process is restarted";
+    case BHClientStatusCannotAsk:
+      return "values are recorded until the segment is full: this process, which has changed its "
+             "user "
+             "or root folder, cannot ask for a fold in /run/tavrel/stat";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
              "bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or 256 KiB of "
@@ -136,6 +140,7 @@ static BHClientStatus currentStatus(void) {
   }
   if (isRemoved(process)) return BHClientStatusRemoved;
   if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
+  if (!bhMayAskForFold(process->folder)) return BHClientStatusCannotAsk;
   return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
 }
 

@@ -93,6 +93,12 @@ void bhPostFoldWanted(const char* folder) {
   closeFile(directory);
 }
 
+/* Other errors say nothing about the rights of the process: some sandboxes refuse the call. */
+bool bhMayAskForFold(const char* folder) {
+  return faccessat(AT_FDCWD, folder, W_OK | X_OK, AT_EACCESS) == 0 ||
+         (errno != EACCES && errno != ENOENT);
+}
+
 /* Checked first, since growing a file beyond the limit would raise SIGXFSZ. */
 static bool mayMakeFilesThatLarge(void) {
   struct rlimit limit;

@@ -78,6 +78,7 @@ class Status(enum.IntEnum):
     FULL = 8
     KEY_REFUSED = 9
     REMOVED = 10
+    CANNOT_ASK = 11
 
 
 def status() -> tuple[Status, str]:

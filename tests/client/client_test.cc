@@ -386,16 +386,31 @@ TEST_F(Recording, SaysWhenItsFileIsGone) {
   }
 }
 
-TEST_F(Recording, AProcessThatChangesItsRootFolderGoesOn) {
+TEST_F(Recording, AProcessThatChangesItsRootFolderOrUserGoesOn) {
   if (geteuid() != 0) GTEST_SKIP() << "not root";
   run([this] {
     record(1);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
     ASSERT_EQ(chroot(root.c_str()), 0);
     record(2);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusCannotAsk);
+  });
+  chmod(root.c_str(), 0755);
+  chmod(folder.c_str(), 01770);
+  run([] {
+    record(3);
+    ASSERT_TRUE(setgroups(0, nullptr) == 0 && setegid(12) == 0 && seteuid(12) == 0);
+    record(4);
+    const char* text = nullptr;
+    EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusCannotAsk);
+    EXPECT_STREQ(text,
+                 "values are recorded until the segment is full: this process, which has changed "
+                 "its user or root folder, cannot ask for a fold in /run/tavrel/stat");
+    ASSERT_EQ(seteuid(0), 0);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
   });
   fold();
-  EXPECT_EQ(records["series"], (std::vector<double>{1, 2}));
+  EXPECT_EQ(records["series"], (std::vector<double>{1, 2, 3, 4}));
 }
 
 TEST_F(Recording, AThreadIsNotCancelledInItsFirstValue) {

@@ -32,7 +32,10 @@
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
- * After fork the child records into memory of its own. Do not record between vfork and exec.
+ * After fork the child records into memory of its own. Do not record between vfork and exec. A
+ * program that changes its user, its groups or its root folder should record its first value
+ * afterwards: otherwise its values are the former user's, and when its segment fills up, it may
+ * have no right to ask for a fold.
  */
 #ifndef BRIMHOLD_CLIENT_H
 #define BRIMHOLD_CLIENT_H
@@ -95,7 +98,8 @@ typedef enum BHClientStatus {
   BHClientStatusFailed = 7,      /* the system failed for another reason */
   BHClientStatusFull = 8,        /* values are dropped until a fold makes room */
   BHClientStatusKeyRefused = 9,  /* values are kept, but a look-up was refused */
-  BHClientStatusRemoved = 10     /* the file that takes the values has been removed */
+  BHClientStatusRemoved = 10,    /* the file that takes the values has been removed */
+  BHClientStatusCannotAsk = 11   /* values are kept, but the process can ask for no fold */
 } BHClientStatus;
 
 /* Says whether values recorded now are kept, and if not, why. Starts recording if necessary.
