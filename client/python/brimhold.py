@@ -127,7 +127,7 @@ class Scalar:
         _library.BHClientScalarAdd(self._handle, _integer(amount))
 
     def set(self, value: typing.SupportsIndex) -> None:
-        """Replaces today's value."""
+        """Replaces today's value, except what other processes have added since the last fold."""
         _library.BHClientScalarSet(self._handle, _integer(value))
 
 

@@ -75,8 +75,10 @@ Command addRecording(Command group, const char* name, const char* description,
 
 void addRecordCommands(Command group, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
-  addRecording(group, "set", "Set today's value of a scalar", arguments, context,
-               changeScalar<&ValueRecorder::set>)
+  addRecording(
+      group, "set",
+      "Set today's value of a scalar; other programs' adds since the last fold come on top",
+      arguments, context, changeScalar<&ValueRecorder::set>)
       .addOption("N", arguments->number, "64-bit integer")
       .required();
   addRecording(group, "add", "Add to today's value of a scalar", arguments, context,

@@ -28,7 +28,8 @@
  *    some milliseconds). While the clock is older than this library, as on a device that has just
  *    started without a battery clock, values are dated once it has been set.
  *  - A set replaces what this process added or set earlier that day; when two processes set a
- *    scalar, the later set counts.
+ *    scalar, the later set counts. What other processes have added since the last fold, before
+ *    the set or after it, comes on top.
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
@@ -65,7 +66,7 @@ BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char*
 /* Adds to today's value, which starts at 0: an add of 0 shows that the program has run. Sums wrap
  * in two's complement. */
 BH_CLIENT_PUBLIC void BHClientScalarAdd(BHClientScalarKey* key, int64_t amount);
-/* Replaces today's value. */
+/* Replaces today's value, except what other processes have added since the last fold. */
 BH_CLIENT_PUBLIC void BHClientScalarSet(BHClientScalarKey* key, int64_t value);
 
 /* Appends a measurement. */
