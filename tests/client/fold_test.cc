@@ -470,9 +470,14 @@ TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
     add(1);
     record(0);
   });
-  EXPECT_EQ(foldNow().removed, 0U);
+  const Descriptor segment(open(segments().at(0).c_str(), O_WRONLY | O_CLOEXEC));
+  const std::uint64_t lost = 7;
+  EXPECT_EQ(pwrite(segment.get(), &lost, sizeof lost, kBHHeaderDropped), 8);
+  FoldReport report = foldNow();
+  EXPECT_EQ(report.removed + report.dropped, 0U);
   testClock().realtime = kToday * 86'400;
-  EXPECT_EQ(foldNow().removed, 1U);
+  report = foldNow();
+  EXPECT_EQ(report.dropped, 7U);
   look();
   EXPECT_EQ(scalar("count", kToday), 1);
   expectEachOnce(1);

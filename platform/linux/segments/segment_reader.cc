@@ -214,10 +214,14 @@ std::size_t SegmentReader::positionBytes() const {
 SegmentProgress SegmentReader::read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                                     SegmentSink& sink) {
   Reading reading{position, boot, writerIsGone, sink, {}, {}};
-  const std::uint64_t dropped = file_.word64(kBHHeaderDropped);
-  reading.progress.dropped = dropped - position.dropped;
+  const std::uint64_t dropped = file_.word64(kBHHeaderDropped) - position.dropped;
+  if (boot) {
+    reading.progress.dropped = dropped;
+    position.dropped += dropped;
+  } else if (dropped > 0) {
+    reading.progress.isComplete = false;  // there is no day under which to count them yet
+  }
   reading.progress.nextFolds = file_.word64(kBHHeaderFolds) + 1;
-  position.dropped = dropped;
   readCells(reading);
   const std::uint32_t chunks = chunksUsed();
   if (position.chunks.size() < chunks) position.chunks.resize(chunks);

@@ -53,7 +53,7 @@ class SegmentSink {
 };
 
 /// The UTC instant of the boot in seconds since 1970; nothing while the clock is not credible;
-/// values without a date then wait.
+/// values and losses without a date then wait.
 using BootInstant = std::optional<std::int64_t>;
 
 /// The same by this machine's clocks. Not credible: a clock that shows a day before the build.
@@ -67,7 +67,7 @@ struct SegmentProgress {
   };
   std::vector<Acknowledgement> acknowledgements;
   std::uint64_t nextFolds = 0;
-  std::uint64_t dropped = 0;  // values that the program lost since the position
+  std::uint64_t dropped = 0;  // values that the program lost since the position; 0 without a date
   std::uint64_t refused = 0;  // values of invalid keys or days, skipped for good
   bool isComplete = true;     // false: values without a date, or that changed, wait
 };
