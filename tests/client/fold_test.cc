@@ -226,10 +226,12 @@ TEST_F(FoldTest, WaitsMinutesForAnotherFold) {
   Expected<Descriptor> other = FileSystem().lockFile(path);
   ASSERT_TRUE(other);
   testClock().monotonic = 1;
+  std::ofstream(folder / "fold-wanted").flush();
   EXPECT_EQ(
       foldNow().failure,
       "cannot lock " + path +
           ": another process has had it locked for 600 seconds; it is folding: try again later");
+  EXPECT_FALSE(std::filesystem::exists(folder / "fold-wanted"));
   testClock().monotonic = 1;
   std::thread end([&] {
     while (testClock().monotonic < 300)

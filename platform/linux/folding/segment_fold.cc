@@ -389,14 +389,14 @@ FoldReport SegmentFold::run() {
   }
   if (!*folder) return report;
   report.hasFolder = true;
+  // Also when this fold fails: a request that stays starts one fold after another.
+  const Status cleared = (*folder)->clearRequest();
   auto notes = FoldNotes::lock(root_, files_, log_);
   if (!notes) {
     report.failure = notes.error().message;
     return report;
   }
-  if (const Status cleared = (*folder)->clearRequest(); !cleared) {
-    notes->tell(cleared.error().message);
-  }
+  if (!cleared) notes->tell(cleared.error().message);
   const Expected<SegmentFolder::Listing> listing = (*folder)->list();
   if (!listing) {
     report.failure = listing.error().message;
