@@ -48,7 +48,7 @@ void bhDrop(struct Process* process, struct Segment* segment);
 struct SegmentName {
   uint64_t time; /* CLOCK_MONOTONIC, nanoseconds */
   uint64_t thread;
-  uint64_t root; /* tells the process's root folder from another one */
+  uint64_t root; /* tells the process's root folder and mounts from others */
 };
 
 /* Creates and maps a new segment and fills in its header; NULL with `status` on failure. */
@@ -56,7 +56,7 @@ struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
                                BHClientStatus* status);
 void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segment* segment);
 /* Whether the segment's file, or its folder, has been removed. Not known, and false, in a process
- * that has changed its root folder. */
+ * that has changed its root folder or mounts. */
 bool bhWasRemoved(const char* folder, struct SegmentName name);
 /* Whether the process could create the file that asks for a fold. */
 bool bhMayAskForFold(const char* folder);

@@ -2,6 +2,7 @@
 #include <stdlib.h>
 #include <string.h>
 #include <sys/mman.h>
+#include <unistd.h>
 
 #include "internal.h"
 
@@ -23,10 +24,17 @@ static bool findFolder(char folder[kLongestFolder]) {
   size_t length = root ? strlen(root) : 0;
   while (length > 0 && root[length - 1] == '/')
     --length;
-  if (length + sizeof kFolder > kLongestFolder) return false;
+  size_t start = 0;
+  if (length > 0 && root[0] != '/') {
+    /* The program may leave its working directory. */
+    if (!getcwd(folder, kLongestFolder - 1)) return false;
+    start = strlen(folder);
+    folder[start++] = '/';
+  }
+  if (length + sizeof kFolder > kLongestFolder - start) return false;
   /* NOLINTNEXTLINE(bugprone-not-null-terminated-result): the next copy appends the zero */
-  if (length > 0) memcpy(folder, root, length);
-  memcpy(folder + length, kFolder, sizeof kFolder);
+  if (length > 0) memcpy(folder + start, root, length);
+  memcpy(folder + start + length, kFolder, sizeof kFolder);
   return true;
 }
 

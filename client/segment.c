@@ -94,7 +94,8 @@ static const char* textOf(BHClientStatus status) {
     case BHClientStatusNoFolder:
       return "the device has no folder /run/tavrel/stat: nothing is recorded";
     case BHClientStatusNotAllowed:
-      return "this user may not create files in /run/tavrel/stat: nothing is recorded";
+      return "this user may not create files in /run/tavrel/stat, or it is read-only for this "
+             "process: nothing is recorded";
     case BHClientStatusNotInMemory:
       return "/run/tavrel/stat is not on a tmpfs: nothing is recorded";
     case BHClientStatusNoSpace:
@@ -111,8 +112,7 @@ static const char* textOf(BHClientStatus status) {
              "process is restarted";
     case BHClientStatusCannotAsk:
       return "values are recorded until the segment is full: this process, which has changed its "
-             "user "
-             "or root folder, cannot ask for a fold in /run/tavrel/stat";
+             "user, root folder or mounts, cannot ask for a fold in /run/tavrel/stat";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
              "bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or 256 KiB of "

@@ -51,10 +51,13 @@ static char* appendHex(char* to, uint64_t number) {
   return to;
 }
 
+/* Of the root folder and the mount namespace: with others, the segment's path leads elsewhere. */
 static uint64_t rootFolder(void) {
   struct stat root = {0};
+  struct stat mounts = {0};
   (void)stat("/", &root);
-  return (uint64_t)root.st_dev << 32 ^ (uint64_t)root.st_ino;
+  (void)stat("/proc/self/ns/mnt", &mounts);
+  return (uint64_t)root.st_dev << 32 ^ (uint64_t)root.st_ino ^ (uint64_t)mounts.st_ino << 16;
 }
 
 static struct SegmentName makeName(unsigned attempt) {

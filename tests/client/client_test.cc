@@ -405,12 +405,30 @@ TEST_F(Recording, AProcessThatChangesItsRootFolderOrUserGoesOn) {
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusCannotAsk);
     EXPECT_STREQ(text,
                  "values are recorded until the segment is full: this process, which has changed "
-                 "its user or root folder, cannot ask for a fold in /run/tavrel/stat");
+                 "its user, root folder or mounts, cannot ask for a fold in /run/tavrel/stat");
     ASSERT_EQ(seteuid(0), 0);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
   });
   fold();
   EXPECT_EQ(records["series"], (std::vector<double>{1, 2, 3, 4}));
+}
+
+TEST_F(Recording, AProcessThatMovesIsNotTakenForOneWithoutAFile) {
+  run([this] {
+    ASSERT_EQ(chdir(root.parent_path().c_str()), 0);
+    setenv("TAVREL_ROOT", root.filename().c_str(), 1);
+    record(1);
+    ASSERT_EQ(chdir("/"), 0);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
+    if (unshare(CLONE_NEWNS) != 0 ||
+        mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
+        mount("none", root.c_str(), "tmpfs", 0, nullptr) != 0) {
+      return;
+    }
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusCannotAsk);
+  });
+  fold();
+  EXPECT_EQ(records["series"], std::vector<double>{1});
 }
 
 TEST_F(Recording, AThreadIsNotCancelledInItsFirstValue) {
