@@ -37,6 +37,8 @@ constexpr std::string_view kUrlKey = "URL";
 constexpr std::string_view kMeteredKey = "MeteredInterfaces";
 
 // Nothing when the URL lacks that part.
+constexpr const char* kNoUrl = "URL is not an address: give https://HOST/FOLDER";
+
 std::optional<std::string> partOf(CURLU* url, CURLUPart part) {
   char* text = nullptr;
   if (curl_url_get(url, part, &text, 0) != CURLUE_OK) return std::nullopt;
@@ -57,7 +59,7 @@ std::string takeUrl(std::string_view text, Configuration& configuration) {
     return "URL begins with http: use https, or set AllowPlainHTTP in a laboratory";
   }
   if (scheme != "https" && scheme != "http") {
-    return "URL is not an address: give https://HOST/FOLDER";
+    return kNoUrl;
   }
   for (const CURLUPart part :
        {CURLUPART_USER, CURLUPART_PASSWORD, CURLUPART_QUERY, CURLUPART_FRAGMENT}) {
@@ -104,7 +106,8 @@ std::string takeEntry(std::string_view key, const plist::Value& value,
     return {};
   }
   if (key == kMeteredKey) return takeInterfaces(value, configuration);
-  if (key == kUrlKey) return {};  // checked once it is known whether it may be plain
+  // Its text is checked once it is known whether it may be plain.
+  if (key == kUrlKey) return value.string() ? std::string() : kNoUrl;
   return format("%s is not a setting: see tavrel-upload(8)", key.substr(0, 100));
 }
 

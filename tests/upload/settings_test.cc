@@ -151,6 +151,7 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
       {url + "http://a</string>",
        "URL begins with http: use https, or set AllowPlainHTTP in a laboratory"},
       {url + "ftp://a/b</string>", noUrl},
+      {"<key>URL</key><integer>1</integer>", noUrl},
       {url + "https://a /b</string>", noUrl},
       {url + "https://u@a/b</string>", more},
       {url + "https://a/b?c</string>", more},
