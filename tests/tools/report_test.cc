@@ -211,7 +211,7 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
        "radio0 <id 0x100000202>: bad legend\ntavrelctl: these drivers are left out: 'tavrelctl "
        "registry show ID' shows what they publish"},
       {noHub, "sample --group None", 1, "no channel matches: 'tavrelctl report list' shows all"},
-      {noHub, "list --live --recorded", 2, "--recorded and --live exclude each other" + what},
+      {noHub, "list --live --recorded", 2, "--live and --recorded exclude each other" + what},
       {noHub, "list --category 0x10000", 2,
        "--category: not a number of at most 16 bits: 0x10000" + what},
       {noHub, "list --format sample", 2,
