@@ -108,8 +108,8 @@ void tidy(ToolContext& context, bool isQuiet) {
 }  // namespace
 
 void addLimitsCommand(Command app, ToolContext& context) {
-  const Command command = app.addCommand(
-      "limits", "Show how much the device keeps, beside its limits");
+  const Command command =
+      app.addCommand("limits", "Show how much the device keeps, beside its limits");
   context.addJsonOption(command);
   command.onRun([&context] { showLimits(context); });
 }

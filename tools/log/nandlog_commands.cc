@@ -247,8 +247,7 @@ void show(ToolContext& context) {
 }  // namespace
 
 void addNandlogCommands(Command app, ToolContext& context) {
-  const Command group =
-      app.addGroup("nandlog", "Show the text log of the flash storage's health");
+  const Command group = app.addGroup("nandlog", "Show the text log of the flash storage's health");
   const Command showCommand =
       group.addCommand("show", "Show the newest NAND log, and when the next one may be written");
   context.addJsonOption(showCommand);
