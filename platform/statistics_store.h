@@ -65,6 +65,9 @@ class BHHistoryDistributionEnumerator {
 /// greater than `minDaysSince1970` and at most `maxDaysSince1970`. Rows arrive ordered by key
 /// (bytewise), then by day, before the query returns; the handler may set `stop` to end it early.
 /// Bounds have more bits than days, so that they can express the day before the first one.
+///
+/// A query returns false when rows or values are missing because the store could not be read. The
+/// system log has the reason.
 class BHHistory {
  public:
   using ScalarRowHandler =
@@ -75,10 +78,10 @@ class BHHistory {
 
   virtual ~BHHistory() = default;
 
-  virtual void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  virtual bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                    std::int64_t maxDaysSince1970,
                                    const ScalarRowHandler& rowHandler) = 0;
-  virtual void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  virtual bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                          std::int64_t maxDaysSince1970,
                                          const DistributionRowHandler& rowHandler) = 0;
 };
@@ -102,7 +105,8 @@ class StatisticsStore {
   virtual void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) = 0;
 
   /// The history at its default location. A store that cannot be read is reported to the system
-  /// log, and the history then has no rows.
+  /// log, and the history then has no rows. A store that does not exist yet has none either, but
+  /// none are missing.
   virtual std::unique_ptr<BHHistory> initWithDefaultPath() = 0;
 };
 

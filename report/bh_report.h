@@ -67,7 +67,8 @@ class BHReport {
   void reportVMStats();
 
  private:
-  void collect(std::int32_t day);
+  // False when statistics could not be read.
+  bool collect(std::int32_t day);
 
   // An empty handle for a key that may not be reported.
   plist::Dictionary optionsForScalar(std::string_view key) const;

@@ -17,10 +17,13 @@ struct OutcomeTexts {
 // One row per outcome, in enumeration order. The reasons are worded for past and future runs.
 constexpr OutcomeTexts kTexts[] = {
     {"filed", ""},
+    {"filed-in-part", ""},
     {"not-permitted", "submission is not allowed for that day"},
     {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},
+    {"store-unreadable",
+     "the statistics store could not be read; once it can, force a run for that day"},
     {"not-filed", "filing failed; see the system log"},
 };
 static_assert(std::size(kTexts) == static_cast<std::size_t>(LogOutcome::NotFiled) + 1);
@@ -37,6 +40,10 @@ std::string_view whyNoLog(LogOutcome outcome) {
 
 std::string logOutcomeText(LogOutcome outcome, std::string_view day) {
   if (outcome == LogOutcome::Filed) return format("a log for day %s", day);
+  if (outcome == LogOutcome::FiledInPart) {
+    return format("a log for day %s without statistics that could not be read; see the system log",
+                  day);
+  }
   return format("no log for day %s: %s", day, whyNoLog(outcome));
 }
 

@@ -12,16 +12,19 @@ namespace tavrel {
 
 enum class LogOutcome : std::uint8_t {
   Filed,
+  FiledInPart,  // without statistics that could not be read; the system log has the error
   NotPermitted,
   PermissionUnknown,  // preferences cannot be read; the system log has the error
   NoWhitelist,
   NothingToReport,
-  NotFiled,  // the system log has the error
+  StoreUnreadable,  // nothing was found, but not all could be read; the system log has the error
+  NotFiled,         // the system log has the error
 };
 
-/// Why there is no log, such as "submission is not allowed for that day"; empty for a filed one.
+/// Why there is no log, such as "submission is not allowed for that day"; empty for one filed, even
+/// in part.
 std::string_view whyNoLog(LogOutcome outcome);
-/// "a log for day DAY", or "no log for day DAY: " and the reason.
+/// "a log for day DAY", with what it lacks, or "no log for day DAY: " and the reason.
 std::string logOutcomeText(LogOutcome outcome, std::string_view day);
 /// Its name in preferences and JSON, such as "not-permitted".
 std::string_view nameOf(LogOutcome outcome);

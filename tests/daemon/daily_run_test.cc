@@ -133,12 +133,20 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
   EXPECT_EQ(run(2), "no log for day 2: no value found for any whitelisted key");
   run(3);
   EXPECT_EQ(std::ranges::count(fake.journal, kOwn + "LastLogOutcome"), 0);
-  fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}};
+  fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}, {"k", 6, 1}};
   EXPECT_EQ(run(4), "writing tallied log. yesterday=4");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("filed"));
+  fake.store.distributionsAreReadable = false;
+  EXPECT_EQ(run(5),
+            "a log for day 5 without statistics that could not be read; see the system log");
+  EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("filed-in-part"));
   fake.submission.fails = true;
-  EXPECT_EQ(run(5), "writing tallied log. yesterday=5");
+  EXPECT_EQ(run(6), "writing tallied log. yesterday=6");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("not-filed"));
+  EXPECT_EQ(run(7),
+            "no log for day 7: the statistics store could not be read; once it can, force a run "
+            "for that day");
+  EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("store-unreadable"));
 }
 
 TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {

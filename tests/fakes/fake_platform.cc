@@ -12,15 +12,16 @@ class FakeHistory : public BHHistory {
  public:
   explicit FakeHistory(FakeStore& store) : store_(store) {}
 
-  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
+  bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
                            const ScalarRowHandler& handler) override {
     bool stop = false;
     for (const auto& [key, day, value] : store_.scalars) {
       if (key.starts_with(prefix) && day > min && day <= max) handler(key, day, value, stop);
     }
+    return store_.scalarsAreReadable;
   }
 
-  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
+  bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t min, std::int64_t max,
                                  const DistributionRowHandler& handler) override {
     bool stop = false;
     for (const auto& [key, day, values] : store_.distributions) {
@@ -29,6 +30,7 @@ class FakeHistory : public BHHistory {
       handler(key, day, enumerator, stop);
       if (enumerator.wasRead) store_.keysRead.insert(key);
     }
+    return store_.distributionsAreReadable;
   }
 
  private:

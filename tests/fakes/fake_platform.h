@@ -97,6 +97,7 @@ struct FakeStore : StatisticsStore {
   std::vector<std::tuple<std::string, std::int32_t, std::vector<double>>> distributions;
   std::set<std::string> keysRead;  // distributions whose values were read
   bool keepsValues = true;
+  bool scalarsAreReadable = true, distributionsAreReadable = true;
 
   std::int32_t BHDaysSince1970() override { return today; }
   plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }

@@ -38,8 +38,11 @@ struct Service : ProcessServices {
   }
   void readRowsOf(std::int32_t day) {
     const auto history = days.initWithDefaultPath();
-    if (day % 2 == 0) return history->scalarsForKeyPrefix("", day - 1, day, {});
-    history->distributionsForKeyPrefix("", day - 1, day, {});
+    if (day % 2 == 0) {
+      history->scalarsForKeyPrefix("", day - 1, day, {});
+    } else {
+      history->distributionsForKeyPrefix("", day - 1, day, {});
+    }
   }
   bool file(std::string_view name = "log-tallied", const plist::Dictionary& options = {}) {
     readRowsOf(kToday - 1);

@@ -162,6 +162,34 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   expect("CRITICAL clock: today is day", 2);
 }
 
+TEST_F(CheckTest, JudgesTheLastLog) {
+  writeRun(kHour, true);
+  device.write(kWhitelistFile, xmlOf("{}"));
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
+  const std::string own = "prefs set com.norvane.tallied.tavrel ";
+  device.run(own + "LastCrashLogSerializationDateInDaysSince1970 20001 --int");
+  const std::string day = " log for day 20001 (2024-10-05)";
+  for (const auto& [outcome, line, status] :
+       {std::tuple("filed", "OK last-log: the last run: a" + day + "\n", 0),
+        {"filed-in-part",
+         "WARNING last-log: the last run: a" + day +
+             " without statistics that could not be read; see the system log\n",
+         1},
+        {"nothing-to-report",
+         "WARNING last-log: the last run: no" + day + ": no value found for any whitelisted key\n",
+         1},
+        {"store-unreadable",
+         "CRITICAL last-log: the last run: no" + day +
+             ": the statistics store could not be read; once it can, force a run for that day\n",
+         2},
+        {"not-filed",
+         "CRITICAL last-log: the last run: no" + day + ": filing failed; see the system log\n",
+         2}}) {
+    device.run(own + "LastLogOutcome " + outcome);
+    expect(line, status);
+  }
+}
+
 TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
   writeRun(kHour, true);
   const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";

@@ -69,9 +69,11 @@ CheckState stateOf(LogOutcome outcome) {
       return CheckState::Ok;
     case LogOutcome::PermissionUnknown:
       return CheckState::Unknown;
+    case LogOutcome::FiledInPart:
     case LogOutcome::NoWhitelist:
     case LogOutcome::NothingToReport:
       return CheckState::Warning;
+    case LogOutcome::StoreUnreadable:
     case LogOutcome::NotFiled:
       break;
   }

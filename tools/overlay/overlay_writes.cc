@@ -11,29 +11,32 @@ class OverlayHistory final : public BHHistory {
   OverlayHistory(std::unique_ptr<BHHistory> below, const OverlayEvents& events)
       : below_(std::move(below)), events_(events) {}
 
-  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override {
     std::uint64_t rows = 0;
-    below_->scalarsForKeyPrefix(
+    const bool isComplete = below_->scalarsForKeyPrefix(
         prefix, minDaysSince1970, maxDaysSince1970,
         [&](std::string_view key, std::int32_t day, std::int64_t value, bool& stop) {
           ++rows;
           rowHandler(key, day, value, stop);
         });
     tell("scalars", minDaysSince1970, maxDaysSince1970, rows);
+    return isComplete;
   }
-  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override {
     std::uint64_t rows = 0;
-    below_->distributionsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970,
-                                      [&](std::string_view key, std::int32_t day,
-                                          BHHistoryDistributionEnumerator& values, bool& stop) {
-                                        ++rows;
-                                        rowHandler(key, day, values, stop);
-                                      });
+    const bool isComplete =
+        below_->distributionsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970,
+                                          [&](std::string_view key, std::int32_t day,
+                                              BHHistoryDistributionEnumerator& values, bool& stop) {
+                                            ++rows;
+                                            rowHandler(key, day, values, stop);
+                                          });
     tell("distributions", minDaysSince1970, maxDaysSince1970, rows);
+    return isComplete;
   }
 
  private:

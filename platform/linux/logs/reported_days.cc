@@ -11,17 +11,18 @@ class ReportedDays::History final : public BHHistory {
   History(std::unique_ptr<BHHistory> history, std::optional<std::int64_t>& earliest)
       : history_(std::move(history)), earliest_(earliest) {}
 
-  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override {
     note(minDaysSince1970);
-    history_->scalarsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970, rowHandler);
+    return history_->scalarsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970, rowHandler);
   }
-  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override {
     note(minDaysSince1970);
-    history_->distributionsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970, rowHandler);
+    return history_->distributionsForKeyPrefix(prefix, minDaysSince1970, maxDaysSince1970,
+                                               rowHandler);
   }
 
  private:

@@ -139,7 +139,7 @@ SqliteHistory::SqliteHistory(StoreSite site, std::optional<FileIdentity> identit
                              std::optional<ReadableStore> store)
     : site_(std::move(site)), identity_(identity), store_(std::move(store)) {}
 
-void SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+bool SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                         std::int64_t maxDaysSince1970,
                                         const ScalarRowHandler& rowHandler) {
   try {
@@ -148,13 +148,16 @@ void SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t mi
     });
   } catch (const StoreFailure& failure) {
     report(failure);
+    return false;
   }
+  return !isIncomplete_;
 }
 
-void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
+bool SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                                               std::int64_t minDaysSince1970,
                                               std::int64_t maxDaysSince1970,
                                               const DistributionRowHandler& rowHandler) {
+  bool isComplete = !isIncomplete_;
   try {
     readUnchanged([&] {
       readDistributions(
@@ -162,11 +165,16 @@ void SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
           [&rowHandler](std::string_view key, std::int32_t day, std::int64_t,
                         BHHistoryDistributionEnumerator& values,
                         bool& stop) { rowHandler(key, day, values, stop); },
-          [this](const StoreFailure& failure) { site_.tell(failure); });
+          [&](const StoreFailure& failure) {
+            site_.tell(failure);
+            isComplete = false;
+          });
     });
   } catch (const StoreFailure& failure) {
     report(failure);
+    return false;
   }
+  return isComplete;
 }
 
 // Data read without locks is valid only if nobody has written in the meantime.
@@ -369,6 +377,7 @@ void SqliteHistory::report(const StoreFailure& failure) {
   std::optional<StoreFailure> untold = failure;
   if (failure.fault == StoreFault::Damaged && !store_->lockless) {
     store_.reset();
+    setIncomplete();
     untold = site_.setAside(identity_, failure);
   }
   if (untold) site_.tell(*untold);

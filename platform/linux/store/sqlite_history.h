@@ -32,10 +32,13 @@ class SqliteHistory : public BHHistory {
   SqliteHistory(StoreSite site, std::optional<FileIdentity> identity,
                 std::optional<ReadableStore> store);
 
-  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  /// From now on each query says that rows are missing.
+  void setIncomplete() { isIncomplete_ = true; }
+
+  bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override;
-  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override;
 
@@ -110,6 +113,7 @@ class SqliteHistory : public BHHistory {
   StoreSite site_;
   std::optional<FileIdentity> identity_;
   std::optional<ReadableStore> store_;
+  bool isIncomplete_ = false;
   std::int64_t version_ = kSchemaVersion;  // as it was when the query began
 };
 

@@ -76,6 +76,7 @@ std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
     } catch (const StoreFailure& failure) {
       if (failure.fault != StoreFault::Damaged || again) return failure;
       if (auto obstacle = site_.setAside(identity, failure)) return obstacle;
+      hasLostRows_ = true;
     }
   }
 }
@@ -202,6 +203,7 @@ std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
     site_.log.write(LogLevel::Info,
                     site_.describe({StoreFault::Other, "nothing has been recorded yet"}));
   }
+  if (failure || hasLostRows_) history->setIncomplete();
   return history;
 }
 
@@ -228,6 +230,7 @@ Status SqliteStore::replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Err
   if (const auto obstacle = site_.setAside(damage->file, damage->failure)) {
     return Error{site_.describe(*obstacle)};
   }
+  hasLostRows_ = true;
   return Done{};
 }
 
