@@ -18,8 +18,8 @@ void deliver(Platform& platform, const plist::Array& appData) {
   requested = false;  // even if the run throws: the list has arrived
   if (!runDailyIfNeeded(platform, appInfo)) {
     platform.log->write(LogLevel::Info,
-                        "dropped the list: the daily run had already taken place; deliver it "
-                        "before tavrel-daily.timer starts the run");
+                        "dropped the list: the daily run had already taken place, and only a list "
+                        "delivered before it gets into the log");
   }
 }
 
