@@ -150,9 +150,16 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
         {kCpu + "cpu1/cpuidle/state0/name", "a\n"},
         {kCpu + "cpu1/cpuidle/state0/time", "8\n"},
         {kCpu + "cpu1/cpuidle/state1/name", "a\n"},
-        {kCpu + "cpu1/cpuidle/state2/name", "0:a\n"}},
+        {kCpu + "cpu1/cpuidle/state1/time", "0\n"},
+        {kCpu + "cpu1/cpuidle/state2/name", "0:a\n"},
+        {kCpu + "cpu1/cpuidle/state2/time", "9\n"},
+        // With an unknown residency, the shares of the others are unknown, too.
+        {kCpu + "cpu2/cpuidle/state0/name", "a\n"},
+        {kCpu + "cpu2/cpuidle/state0/time", "8\n"},
+        {kCpu + "cpu2/cpuidle/state1/name", "b\n"},
+        {kCpu + "cpu2/cpuidle/state1/time", "\n"}},
        "cpu0.idle_states=POLL:1/5 1:retent:2/6 2:retent:3/7  "
-       "cpu1.idle_states=0:a:null/8 1:a:null/null 2:0:a:null/null  "},
+       "cpu1.idle_states=0:a:null/8 1:a:null/0 2:0:a:null/9  "},
       {{{kCpu + "cpufreq/policy0/stats/time_in_state", "1800000 3\n600500 4\n"},
         {kCpu + "cpufreq/policy0/stats/trans_table",
          "   From  :    To\n         :   1800000    600500\n  1800000:         0         7\n"
@@ -166,7 +173,14 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
          "Total transition : 5\n"},
         {"/sys/class/devfreq/gpu/cur_freq", "200000000"}},
        "gpu.frequency=200MHz:2/12* 400MHz:3/34  "},
-      // Without the table of transitions, the entries are unknown, not 0.
+      // Without the whole table of transitions, the entries are unknown, not 0 or too low.
+      {{{kCpu + "cpufreq/policy0/stats/time_in_state", "3000 1\n2000 2\n1000 3\n"},
+        {kCpu + "cpufreq/policy0/stats/trans_table",
+         "   From  :    To\n   :  3000  2000  1000\n 3000:  0  4  5\n 2000:  7"},
+        {kCpu + "cpufreq/policy1/stats/time_in_state", "2000 4\n1000 5\n"},
+        {kCpu + "cpufreq/policy1/stats/trans_table", "   :  2000  1000\n 2000:  0  4\n"}},
+       "policy0.frequency=3MHz:null/10 2MHz:null/20 1MHz:null/30  "
+       "policy1.frequency=2MHz:null/40 1MHz:null/50  "},
       {{{kZone + "cooling_device0/type", "fan\n"},
         {kZone + "cooling_device0/stats/time_in_state_ms", "state0\t5\nstate1\t6\n"},
         {kZone + "cooling_device1/type", "cpu\n"},

@@ -1,5 +1,6 @@
 #include "platform/linux/live/live_machine.h"
 
+#include <algorithm>
 #include <ctime>
 #include <optional>
 #include <span>
@@ -203,7 +204,12 @@ class LiveMachine::Sampling final : public LiveSampling {
     const LiveChannel& channel = *places_[index].channel;
     const LiveSource& source = state_->sources()[places_[index].source];
     const auto values = source.slots().subspan(channel.firstSlot, channel.slots);
-    bool hasValue = false;
+    // With one unknown residency, the shares of all states would be wrong.
+    if (channel.format == ChannelFormat::State &&
+        std::ranges::count(values.subspan(channel.elements), kUnset) > 0) {
+      return 0;
+    }
+    bool hasValue = channel.format == ChannelFormat::State;
     for (std::size_t element = 0; element < channel.elements; ++element) {
       const MutableByteSpan record = room.subspan(element * kElementBytes, kElementBytes);
       storeLittle64(record, kElementDriver, source.driverID());
@@ -217,14 +223,12 @@ class LiveMachine::Sampling final : public LiveSampling {
         store(value, channel.format == ChannelFormat::SimpleArray ? kUnset : 0);
       if (channel.format == ChannelFormat::State) {
         const Residency& states = source.residency(channel);
-        const std::int64_t residency = values[channel.elements + element];
         const bool isCurrent = states.currentSlot < source.slots().size() &&
                                source.slots()[states.currentSlot] == states.numbers[element];
         store(0, static_cast<std::int64_t>(states.ids[element]));
         store(1, values[element]);
-        store(2, residency);
+        store(2, values[channel.elements + element]);
         storeLittle64(record, kElementTimestamp, isCurrent ? ticks_ : 0);
-        hasValue = hasValue || residency != kUnset;
         continue;
       }
       for (std::size_t value = 0; value < kElementValues; ++value) {

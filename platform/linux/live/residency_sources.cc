@@ -1,10 +1,14 @@
 // Sources of residencies: how long a device was in each of its states, and how often it entered
 // them.
+#include <algorithm>
+#include <functional>
 #include <memory>
 #include <string>
+#include <unordered_set>
 #include <vector>
 
 #include "base/ascii.h"
+#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/live/attribute_class.h"
 #include "platform/linux/live/sources.h"
@@ -30,16 +34,32 @@ std::vector<std::string> numberedRows(const std::string& path, const TableForm& 
 }
 
 // A table "FROM: ENTRIES OF STATE 0, OF STATE 1 ..." whose rows add up to the entries of states.
-std::unique_ptr<TableReader> transitionReader(const std::vector<std::string>& states,
-                                              const TableForm& form) {
-  std::vector<Cell> cells;
-  for (std::size_t i = 0; i < states.size(); ++i)
-    cells.push_back({i + 1, static_cast<std::uint32_t>(i)});
-  auto reader = std::make_unique<TableReader>(form, std::move(cells));
-  for (const std::string& state : states)
-    reader->addRow(state, 0);
-  return reader;
-}
+// The kernel cuts a large table to one page: sums of a part would be too low.
+class TransitionReader final : public TextReader {
+ public:
+  TransitionReader(const std::vector<std::string>& states, TableForm form)
+      : states_(states.begin(), states.end()), form_(form) {}
+
+  void read(std::string_view text, std::span<std::int64_t> slots) const override {
+    std::vector<std::int64_t> entries(slots.size());
+    std::size_t rows = 0;
+    while (!text.empty()) {
+      std::string_view line = takeLine(text);
+      if (!states_.contains(keyOfLine(line, form_))) continue;
+      ++rows;
+      for (std::int64_t& sum : entries) {
+        const auto count = parseNumber(takeToken(line, form_.separator));
+        if (!count) return;
+        sum = saturatingSum(sum, *count);
+      }
+    }
+    if (rows == slots.size()) std::ranges::copy(entries, slots.begin());
+  }
+
+ private:
+  std::unordered_set<std::string, KeyedHash, std::equal_to<>> states_;
+  TableForm form_;
+};
 
 std::unique_ptr<TableReader> timeReader(const std::vector<std::string>& states,
                                         const TableForm& form, std::size_t token, Scale scale) {
@@ -73,8 +93,9 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
   }
   residency.ids = stateIDs(names);
   const auto count = static_cast<std::uint32_t>(states.size());
-  const std::uint32_t first = source.addTextFile(
-      table.transitions, count, transitionReader(states, table.form), ReadMode::Once);
+  const std::uint32_t first =
+      source.addTextFile(table.transitions, count,
+                         std::make_unique<TransitionReader>(states, table.form), ReadMode::Once);
   source.addTextFile(
       table.times, count,
       timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale),
