@@ -67,6 +67,37 @@ TEST(LiveMachineTest, ASensorThatBlocksHidesNoOther) {
   Descriptor(open(path.c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
 }
 
+TEST(LiveMachineTest, FewSensorsThatBlockKeepThreadsWaiting) {
+  constexpr std::size_t kWaiting = limits::kWaitingSensors;
+  DeviceServices device;
+  Lines paths;
+  for (std::size_t zone = 0; zone < kWaiting + 2; ++zone) {
+    device.write(kZone + std::to_string(zone) + "/x", "");
+    paths.push_back(device.root.path(kZone + std::to_string(zone) + "/temp"));
+    ASSERT_EQ(mkfifo(paths.back().c_str(), 0600), 0);
+  }
+  device.write("/proc/uptime", "5\n");
+  const auto threads = [] {
+    const std::filesystem::directory_iterator all("/proc/self/task");
+    return std::distance(begin(all), end(all));
+  };
+  const auto before = threads();
+
+  LiveMachine live(device.root, device.log, {20, 5000});
+  Subscribed channels(live);
+  Lines lines;
+  for (std::size_t zone = 0; zone < kWaiting; ++zone)
+    lines.push_back(paths[zone] + " does not answer within 20 ms: left out until it does");
+  for (int reading = 0; reading < 3; ++reading) {
+    EXPECT_EQ(channels.update(), "boot.seconds=5 ");
+    EXPECT_EQ(threads(), before + limits::kWaitingSensors);
+    lines.push_back("2 sensors are left out of this reading, the first is " + paths[kWaiting]);
+    EXPECT_EQ(device.log.lines, lines);
+  }
+  for (std::size_t zone = 0; zone < kWaiting; ++zone)
+    Descriptor(open(paths[zone].c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
+}
+
 TEST(LiveMachineTest, SaysWhatCannotBeListed) {
   DeviceServices device;
   device.write("/proc/uptime", "5\n");

@@ -40,8 +40,13 @@ std::optional<std::string> readSlowly(SlowFile& file) try {
 
 }  // namespace
 
+struct SlowReads::Threads {
+  std::mutex mutex;  // of all readings
+  int count = 0;
+};
+
 struct SlowReads::Round {
-  std::shared_ptr<std::mutex> mutex;
+  std::shared_ptr<Threads> threads;
   std::condition_variable progress;
   std::vector<std::shared_ptr<SlowFile>> files;
   std::vector<std::optional<std::string>> texts;
@@ -52,10 +57,10 @@ struct SlowReads::Round {
 };
 
 SlowReads::SlowReads(SystemLog& log, Patience patience)
-    : log_(log), patience_(patience), mutex_(std::make_shared<std::mutex>()) {}
+    : log_(log), patience_(patience), threads_(std::make_shared<Threads>()) {}
 
 void SlowReads::work(const std::shared_ptr<Round>& round) {
-  std::unique_lock lock(*round->mutex);
+  std::unique_lock lock(round->threads->mutex);
   while (!round->isOver && round->next < round->files.size()) {
     const std::size_t index = round->next++;
     const std::shared_ptr<SlowFile> file = round->files[index];
@@ -64,13 +69,15 @@ void SlowReads::work(const std::shared_ptr<Round>& round) {
       auto text = readSlowly(*file);
       lock.lock();
       file->isWaitedFor = false;
-      if (round->isOver) return;  // and its texts have been taken
+      if (round->isOver) break;  // and its texts have been taken
       round->texts[index] = std::move(text);
     }
     round->isDone[index] = true;
     ++round->done;
     round->progress.notify_all();
   }
+  // With the lock of the last step, so that the next reading does not count this thread.
+  --round->threads->count;
 }
 
 std::vector<std::optional<std::string>> SlowReads::read(
@@ -79,17 +86,17 @@ std::vector<std::optional<std::string>> SlowReads::read(
   const std::size_t count = files.size();
   if (count == 0) return {};
   const auto round = std::make_shared<Round>();
-  round->mutex = mutex_;
+  round->threads = threads_;
   round->files = std::move(files);
   round->texts.resize(count);
   round->isDone.resize(count);
   const std::chrono::milliseconds oneTurn(patience_.oneMilliseconds);
   const auto end = Clock::now() + std::chrono::milliseconds(patience_.allMilliseconds);
-  int threads = 0;
-  std::unique_lock lock(*mutex_);
+  std::unique_lock lock(threads_->mutex);
   while (round->done < count && Clock::now() < end) {
-    // Nothing came for a whole turn: the earlier threads wait for sensors.
-    if (round->next == count || threads++ == limits::kWaitingSensors) break;
+    // Nothing came for a whole turn: the earlier threads wait for sensors, as do those that former
+    // readings have left.
+    if (round->next == count || threads_->count == limits::kWaitingSensors) break;
     if (!startThread(round)) break;
     std::size_t seen = SIZE_MAX;
     while (seen != round->done && round->done < count) {
@@ -99,22 +106,32 @@ std::vector<std::optional<std::string>> SlowReads::read(
     }
   }
   round->isOver = true;
-  for (std::size_t i = 0; i < count; ++i) {
-    if (round->isDone[i]) continue;
-    if (i < round->next) {
+  logMissing(*round);
+  return std::move(round->texts);
+}
+
+void SlowReads::logMissing(const Round& round) {
+  std::size_t unasked = 0;
+  const std::string* first = nullptr;
+  for (std::size_t i = 0; i < round.files.size(); ++i) {
+    if (round.isDone[i]) continue;
+    const SlowFile& file = *round.files[i];
+    if (i < round.next) {
       log_.log(LogLevel::Default, "%s does not answer within %d ms: left out until it does",
-               round->files[i]->path, patience_.oneMilliseconds);
-    } else {
-      log_.log(LogLevel::Default, "%s is left out: the sensors before it took all of the time",
-               round->files[i]->path);
+               file.path, patience_.oneMilliseconds);
+    } else if (!file.isWaitedFor && unasked++ == 0) {
+      first = &file.path;
     }
   }
-  return std::move(round->texts);
+  if (first == nullptr) return;
+  log_.log(LogLevel::Default, "%zu sensors are left out of this reading, the first is %s", unasked,
+           *first);
 }
 
 bool SlowReads::startThread(const std::shared_ptr<Round>& round) {
   try {
     std::thread([round] { work(round); }).detach();
+    ++threads_->count;
     return true;
   } catch (const std::system_error& error) {
     log_.log(LogLevel::Default, "cannot read sensors: no thread: %s", error.what());

@@ -2,11 +2,11 @@
 //
 // A thread reads them one after another. When a file does not answer in time, another thread goes
 // on with the rest, and the reading ends without that file. A later reading leaves it out for as
-// long as the first thread still waits.
+// long as the first thread still waits. While `limits::kWaitingSensors` threads wait, no other
+// starts, and readings have no files.
 #pragma once
 
 #include <memory>
-#include <mutex>
 #include <optional>
 #include <string>
 #include <vector>
@@ -24,7 +24,7 @@ struct SlowFile {
   const std::string path;
   const bool staysOpen;
   Descriptor descriptor = {};
-  bool isWaitedFor = false;  // guarded by the reading's mutex
+  bool isWaitedFor = false;  // guarded by the mutex of all readings
 };
 
 struct Patience {
@@ -41,14 +41,16 @@ class SlowReads {
   std::vector<std::optional<std::string>> read(std::vector<std::shared_ptr<SlowFile>> files);
 
  private:
+  struct Threads;
   struct Round;
   static void work(const std::shared_ptr<Round>& round);
   bool startThread(const std::shared_ptr<Round>& round);
+  void logMissing(const Round& round);
 
   SystemLog& log_;
   const Patience patience_;
   // Shared by all readings: a file may still belong to a thread of an earlier one.
-  const std::shared_ptr<std::mutex> mutex_;
+  const std::shared_ptr<Threads> threads_;
 };
 
 }  // namespace tavrel::live
