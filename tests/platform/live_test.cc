@@ -185,6 +185,18 @@ TEST(LiveMachineTest, AFileThatIsTooLongLosesWholeLines) {
             Lines{device.root.path("/proc/interrupts") + ": only the first 1 rows are shown"});
 }
 
+TEST(LiveMachineTest, AShortTextClaimsLittleMemory) {
+  DeviceServices device;
+  std::string table = " CPU8191\n";
+  for (int i = 0; i < 200; ++i)
+    table += format("%d: 1\n", i);
+  device.write("/proc/interrupts", table);
+  LiveMachine live(device.root, device.log);
+  EXPECT_EQ(live.services().size(), 1U);
+  EXPECT_EQ(device.log.lines,
+            Lines{device.root.path("/proc/interrupts") + ": only the first 128 rows are shown"});
+}
+
 TEST(LiveMachineTest, ShowsTheInterfacesOfProcessOne) {
   DeviceServices device;
   const auto shown = [&device] {

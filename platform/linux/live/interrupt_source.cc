@@ -20,6 +20,10 @@
 namespace tavrel::live {
 namespace {
 
+// Counts of all handlers together. The heading names processors by number, so a short text could
+// claim a place for each processor that the kernel can have.
+constexpr std::size_t kLargestCounts = 1U << 20;
+
 // The numbers of the processors in the heading.
 std::vector<std::uint32_t> processorsIn(std::string_view heading) {
   std::vector<std::uint32_t> numbers;
@@ -98,7 +102,8 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
   std::unordered_map<std::string, std::uint32_t> slots;
   std::vector<std::pair<std::string, std::uint32_t>> names;
   std::size_t rows = 0;
-  while (!text->empty() && rows < limits::kLiveRows) {
+  while (!text->empty() && rows < limits::kLiveRows &&
+         (slots.size() + 1) * width <= kLargestCounts) {
     std::string_view line = takeLine(*text);
     std::string key(keyOf(line));
     if (key.empty()) continue;

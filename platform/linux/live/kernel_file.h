@@ -56,7 +56,7 @@ class KernelFile {
   const std::string& path() const { return path_; }
 
   /// The text as it is now, in `buffer`. Reuses the descriptor of the last read when the budget had
-  /// one; a file that has been replaced since is opened again.
+  /// one, until the device of the file has gone.
   std::optional<std::string_view> read(DescriptorBudget& budget, TextBuffer& buffer);
 
  private:
