@@ -288,6 +288,9 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   const CommandLine command = "nand snapshot - --descriptor " + device.path("/wide");
   const std::string wide(4095, ' ');
   device.check(command, prints("%s\n" + wide + "7|\n" + wide + "8|\n"), words({7, 0, 8}));
+  device.write("/acting", descriptor(2, "\t\x1b[2J%u\xc2\x9b"));
+  device.check("nand snapshot - --descriptor " + device.path("/acting"),
+               prints("%s\n\t\\x1b[2J7\\xc2\\x9b\n"), words({7, 0}));
 
   EXPECT_EQ(device.run("nand snapshot -", std::string(100, 'x')),
             fails("standard input has no complete record: it has 100 bytes, and a record has 252: "

@@ -147,6 +147,15 @@ void counters(ToolContext& context, const Arguments& arguments) {
   printCounters(context.page(), name, record);
 }
 
+// Key and formats come from a device, so what acts on a terminal is escaped, but not the layout.
+void printText(std::ostream& out, std::string_view text) {
+  while (!text.empty()) {
+    const std::size_t end = std::min(text.find_first_of("\n\t"), text.size());
+    out << printable(text.substr(0, end)) << text.substr(end, 1);
+    text.remove_prefix(std::min(end + 1, text.size()));
+  }
+}
+
 void snapshot(ToolContext& context, const Arguments& arguments) {
   if (namesInputTwice(context, arguments)) return;
   const auto records = readBuffer(context, arguments.file);
@@ -176,7 +185,7 @@ void snapshot(ToolContext& context, const Arguments& arguments) {
     context.note(format("%s: the last %zu bytes are less than a record of %zu and were skipped",
                         nameOf(arguments.file), surplus, kSnapshotRecordBytes));
   }
-  context.out() << *text;
+  printText(context.out(), *text);
 }
 
 void freezer(ToolContext& context, const Arguments& arguments) {

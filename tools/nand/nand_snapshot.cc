@@ -37,8 +37,11 @@ Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> 
     if (!checked) return checked.error();
   }
   std::string text;
-  for (std::size_t capacity = kCharactersOfKey + kCharactersPerByte * records.size();
-       capacity <= kLongestText; capacity *= 2) {
+  std::size_t capacity = 0;
+  while (capacity < kLongestText) {
+    capacity =
+        std::min(kLongestText,
+                 std::max(kCharactersOfKey + kCharactersPerByte * records.size(), 2 * capacity));
     text.resize(capacity);
     std::size_t length = capacity;
     const int rendered =
