@@ -78,7 +78,7 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
     prefix += "d-";
   }
   writeEntry(path + "/deep.desktop", "Type=Application");
-  writeEntry(path + "/d/deeper.desktop", "Type=Application");
+  writeEntry(path + "/d\n/deeper.desktop", "Type=Application");
   std::filesystem::create_directory(root.path("/home/eve"));
   std::filesystem::create_directory_symlink(root.path("/elsewhere"), root.path("/home/eve/.local"));
   auto found = bundles();
@@ -86,8 +86,8 @@ TEST_F(ApplicationsTest, FallsBackToDesktopEntries) {
   EXPECT_EQ(found, (Lines{prefix + "deep.desktop System", "editor.desktop System",
                           "kde-mail.desktop User", "tool.desktop User"}));
   EXPECT_EQ(log.lines,
-            Lines{"desktop entries nested more than 16 folders deep do not count, as in " +
-                  root.path(path + "/d") + "; move them up"});
+            Lines{"desktop entries nested more than 16 folders deep do not count, as in \"" +
+                  root.path(path) + "/d\\n\"; move them up"});
 }
 
 TEST_F(ApplicationsTest, SaysWhatCannotBeListed) {
@@ -132,8 +132,8 @@ TEST_F(ApplicationsTest, SaysWhatCannotBeRead) {
   ASSERT_NE(signal(SIGIO, SIG_IGN), SIG_ERR);
   if (fcntl(held.get(), F_SETLEASE, F_WRLCK) != 0) GTEST_SKIP() << "no leases here";
   EXPECT_EQ(bundles(), Lines{}) << "waiting ends the lease after 45 seconds";
-  EXPECT_EQ(log.lines.back(), "cannot read " + tool +
-                                  ": Resource temporarily unavailable; not all applications are "
+  EXPECT_EQ(log.lines.back(), "cannot read \"" + tool +
+                                  "\": Resource temporarily unavailable; not all applications are "
                                   "counted");
 }
 

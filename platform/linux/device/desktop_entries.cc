@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cstdint>
 #include <cstring>
 #include <string>
 #include <string_view>
@@ -14,6 +15,7 @@
 #include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "base/system_text.h"
+#include "base/text.h"
 #include "platform/linux/files/folder_walk.h"
 #include "platform/linux/files/line_reader.h"
 
@@ -47,6 +49,13 @@ void noteFailure(SystemLog& log, std::string_view what, const std::string& folde
   if (code == 0) return;
   log.log(LogLevel::Error, "cannot list the %s in %s: %s; not all applications are counted", what,
           folder, systemText(code));
+}
+
+// A path as the user who made it may have chosen it.
+std::string quoted(std::string_view path) {
+  std::string text;
+  appendQuoted(text, path);
+  return text;
 }
 
 std::vector<DataFolder> dataFolders(const DeviceRoot& root, SystemLog& log) {
@@ -123,7 +132,7 @@ class Enumeration {
         log_.log(
             LogLevel::Error,
             "more than %zu files and folders among desktop entries; those from %s on do not count",
-            limits::kDesktopFiles, path);
+            limits::kDesktopFiles, quoted(path));
         isFull_ = true;
       } else if (path.ends_with(".desktop")) {
         take(path, prefix + entry.d_name, bundleType);
@@ -143,32 +152,33 @@ class Enumeration {
       log_.log(
           LogLevel::Error,
           "desktop entries nested more than %d folders deep do not count, as in %s; move them up",
-          limits::kDesktopFolderDepth, path);
+          limits::kDesktopFolderDepth, quoted(path));
     }
     return true;
   }
 
   void take(const std::string& path, std::string identifier, std::string_view bundleType) {
-    if (seen_.contains(identifier)) return;
+    const std::uint64_t hash = keyedHash(identifier);
+    if (seen_.contains(hash)) return;
     if (seen_.size() == limits::kDesktopEntries) {
       log_.log(LogLevel::Error, "more than %zu desktop entries; those from %s on do not count",
-               limits::kDesktopEntries, path);
+               limits::kDesktopEntries, quoted(path));
       isFull_ = true;
       return;
     }
-    seen_.insert(identifier);
+    seen_.insert(hash);
     const DesktopEntry entry = readEntry(path);
     if (entry.isApplication) handler_({std::move(identifier), bundleType});
     if (entry.errorNumber != 0 && !isNoEntry(entry.errorNumber) &&
         !std::exchange(isUnreadTold_, true)) {
-      log_.log(LogLevel::Error, "cannot read %s: %s; not all applications are counted", path,
-               systemText(entry.errorNumber));
+      log_.log(LogLevel::Error, "cannot read %s: %s; not all applications are counted",
+               quoted(path), systemText(entry.errorNumber));
     }
   }
 
   SystemLog& log_;
   const std::function<void(const PWBundleProxy&)>& handler_;
-  std::unordered_set<std::string, KeyedHash> seen_;
+  std::unordered_set<std::uint64_t> seen_;  // hashes: the names may take 4 KB each
   std::size_t visited_ = 0;
   bool isFull_ = false;
   bool isDepthTold_ = false;
