@@ -149,7 +149,7 @@ inline constexpr int kActivationDescriptors = 64;
 /// shorter.
 inline constexpr std::size_t kTextLineBytes = 64U << 10;
 
-/// Desktop entries that are counted, since counting keeps their names in memory.
+/// Desktop entries that are counted, since counting keeps a hash of each name.
 inline constexpr std::size_t kDesktopEntries = 100'000;
 
 /// Files and folders examined for desktop entries: users may put anything into their folders.

@@ -11,11 +11,15 @@ from programs import Broken, LogServer, run, tool
 PENDING = "var/mobile/Library/Logs/Submission/pending"
 MOMENT = re.compile(r"<date>.*Z</date>")
 NOT_IN_THE_LOG = re.compile("Z (error (statistics store|cannot finish the daily log|cannot file log|"
-                            "cannot read|Couldn't load whitelist|Failed to write)|"
+                            "cannot list|cannot read|Couldn't load whitelist|Failed to write)|"
                             "default Couldn't allocate histCounts)")
 NEVER_CAME = re.compile("never received requested AAI|out of memory|terminate called")
 SUMS = ["cpu.busy_milliseconds", "disk.read_kib", "disk.written_kib", "network.received_kib",
         "network.sent_kib"]
+# What a log makes of lists, and the lines that say that one is cut short.
+LISTED = {"com.norvane.lumenhall.numAllInstalledApps", "com.norvane.lumenhall.numThirdPartyApps",
+          "BHUserInterfaceLanguage", "BHPreferredUserInterfaceLanguage", "BHUserSetRegionFormat"}
+NOT_LISTED = re.compile("Z error cannot (list|read) .*(applications|/locale|/languages)")
 NAMED = re.compile(r' distribution "([^"]*)"|histCounts for key (\S+)\. ')
 
 
@@ -80,13 +84,14 @@ def errors_of(done):
 def lacks_or_differs(log, right, said_why):
     """The entries of a log that nobody said would be missing, or that are wrong."""
     named = [match[1] or match[2] for line in said_why if (match := NAMED.search(line))]
+    excused = LISTED if any(NOT_LISTED.search(line) for line in said_why) else set()
     for group in sorted({*log, *right}):
         ours, theirs = log.get(group), right.get(group)
         if not isinstance(theirs, dict):
             if ours != theirs:
                 yield group
             continue
-        for key in sorted({*(ours or {}), *theirs}):
+        for key in sorted({*(ours or {}), *theirs} - excused):
             is_absent = key not in (ours or {})
             if not (is_absent and (not named or key in named)) and (
                     is_absent or ours[key] != theirs.get(key)):

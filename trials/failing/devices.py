@@ -14,6 +14,10 @@ WHITELIST = "Library/Application Support/Brimhold/Whitelist_Pellio.plist"
 ALLOWED = """<?xml version="1.0" encoding="UTF-8"?>
 <plist version="1.0">
 <dict><key>Example</key><dict>
+  <key>ScalarKeys</key><dict>
+    <key>com.norvane.lumenhall.numAllInstalledApps</key><dict/>
+    <key>com.norvane.lumenhall.numThirdPartyApps</key><dict/>
+  </dict>
   <key>ScalarKeyPrefixes</key><dict><key>com.example.</key><dict/></dict>
   <key>DistributionKeyPrefixes</key><dict><key>com.example.</key><dict>
     <key>intervals</key><array><integer>5</integer><integer>20</integer></array>
@@ -40,10 +44,13 @@ def make_device(root):
     path.write_text(ALLOWED, encoding="ascii")
     for _ in range(3):
         tool(root, "stat", "add", "com.example.starts", "1")
-    for folder in ("usr/share", "home/ann/.local/share"):
-        write_files(root, {f"{folder}/applications/kde/{len(folder)}.desktop":
+    for folder in ("usr/share", "home/ann/.local/share", "home/eve/.local/share"):
+        write_files(root, {f"{folder}/applications/kde/{folder[:8].replace('/', '-')}.desktop":
                            "[Desktop Entry]\nType=Application\n"})
+    # The log's language is that of a folder; without the folder, it would be another one.
     (root / "usr/lib/locale/de_DE.utf8").mkdir(parents=True)
+    write_files(root, {"etc/locale.conf": "LANG=de_DE.UTF-8\n",
+                       "etc/locale.gen": "fr_FR.UTF-8 UTF-8\n"})
 
 
 def file_logs(root):
