@@ -1,7 +1,10 @@
 #include <bit>
 #include <csignal>
 #include <regex>
+#include <sched.h>
+#include <sys/mount.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
 
 #include "device.h"
 #include "tools/shared/tool_context.h"
@@ -346,6 +349,69 @@ TEST(StatCommands, SamplesForTheStoreWaitUntilThereIsAFolder) {
   EXPECT_NE(exported(device).find("usage.samples=61 "), std::string::npos);
 }
 
+TEST(StatCommands, SamplesAreKeptWhenTheirStateIsOnAReadOnlyFileSystem) {
+  const TemporaryDevice device;
+  const std::string run = device.path("/run");
+  std::filesystem::create_directories(run + "/tavrel");
+  // A confined service sees what is made in /run after its start, but cannot write there.
+  const pid_t child = fork();
+  if (child == 0) {
+    const char* const from = run.c_str();
+    if (unshare(CLONE_NEWNS) != 0 ||
+        mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
+        mount(from, from, nullptr, MS_BIND, nullptr) != 0 ||
+        mount("none", from, nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr) != 0) {
+      _exit(77);
+    }
+    PeriodicPace pace;
+    pace.left = 2;
+    pace.between = [] {};
+    EXPECT_EQ(sample(device, "", pace),
+              storeNote(device) + "tavrelctl: cannot write " + run +
+                  "/tavrel/collect.state: Read-only file system; make the file system writable; "
+                  "the samples are kept, but the next process has no rates at first\n");
+    EXPECT_NE(exported(device).find("usage.samples=2 "), std::string::npos);
+    _exit(testing::Test::HasFailure() ? 1 : 0);
+  }
+  int status = 0;
+  ASSERT_EQ(waitpid(child, &status, 0), child);
+  if (WEXITSTATUS(status) == 77) GTEST_SKIP() << "may not mount";
+  EXPECT_EQ(status, 0);
+}
+
+TEST(StatCommands, SamplesThatWaitKeepOtherSamplersAway) {
+  const TemporaryDevice device;
+  device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
+  PeriodicPace pace;
+  pace.left = 3;
+  const auto sampleElsewhere = [&] {
+    PeriodicPace other;
+    other.time = pace.time;
+    other.left = 1;
+    other.between = [] {};
+    return sample(device, "", other);
+  };
+  int readings = 0;
+  pace.between = [&] {
+    ++readings;  // 30 KiB each
+    device.write("/proc/net/dev", format("\n\neth0: %d 0 0 0 0 0 0 0 0 0\n", 30720 * readings));
+    if (readings == 1) {
+      EXPECT_EQ(sampleElsewhere(), storeNote(device));
+    }
+    if (readings != 3) return;
+    EXPECT_EQ(sampleElsewhere(),
+              storeNote(device) + "tavrelctl: cannot lock " +
+                  device.path("/run/tavrel/collect.state.lock") +
+                  ": another process has had it locked for 2 seconds; it may be a sampler whose "
+                  "samples wait for the store: stop it first\nfailed");
+  };
+  EXPECT_EQ(sample(device, "", pace), storeNote(device));
+  EXPECT_EQ(sampleElsewhere(), storeNote(device));
+  const std::string all = exported(device);
+  for (const char* values : {"received_kib=90 ", "samples=5 "})
+    EXPECT_NE(all.find(values), std::string::npos) << values << all;
+}
+
 TEST(StatCommands, SamplesGoOnWithoutTheirStateAndWithoutASensorThatBlocks) {
   const TemporaryDevice device;
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
@@ -354,7 +420,7 @@ TEST(StatCommands, SamplesGoOnWithoutTheirStateAndWithoutASensorThatBlocks) {
   ASSERT_EQ(mkfifo(blocked.c_str(), 0600), 0);
   device.write("/run/full", "");
   PeriodicPace pace;
-  pace.left = 3;
+  pace.left = 61;  // an hour, and one
   pace.between = [] {};
   const std::string state = device.path("/run/full/state");
   EXPECT_EQ(sample(device, state, pace),
@@ -366,7 +432,7 @@ TEST(StatCommands, SamplesGoOnWithoutTheirStateAndWithoutASensorThatBlocks) {
                 "rates\n");
   const std::string all = exported(device);
   for (const char* values :
-       {"usage.samples=3 ", "celsius=41.5 com.norvane.usage.temperature.celsius=41.5 "})
+       {"usage.samples=61 ", "celsius=41.5 com.norvane.usage.temperature.celsius=41.5 "})
     EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
 }
 

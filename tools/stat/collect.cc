@@ -9,12 +9,14 @@
 #include <ostream>
 #include <set>
 #include <string>
+#include <sys/stat.h>
 #include <unistd.h>
 #include <vector>
 
 #include "base/arithmetic.h"
 #include "base/format.h"
 #include "platform/linux/files/boot_id.h"
+#include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/system_log.h"
@@ -237,11 +239,16 @@ class SingleReadings {
         boot_(bootIDOf(context.root())),
         collector_(context, recorder, 1) {}
 
-  void take(std::chrono::nanoseconds now, ValueTime time) {
-    // Another process may have taken a reading since the last one was left.
-    if (!collector_.hasWaiting() && !hasLostState_) startFromState(now);
-    if (!collector_.hasWaiting()) waitingSince_ = now;
+  /// Fails when readings of another process wait.
+  Status take(std::chrono::nanoseconds now, ValueTime time) {
+    if (!collector_.hasWaiting()) {
+      if (Status locked = lock(); !locked) return locked;
+      // Another process may have taken a reading since the last one was left.
+      if (!hasLostState_) startFromState(now);
+      waitingSince_ = now;
+    }
     collector_.read(now, time);
+    return Done{};
   }
 
   /// Whether values for the store may wait for a next reading at `next`: fewer transactions are
@@ -251,30 +258,15 @@ class SingleReadings {
            next - waitingSince_ < kLongestWait;
   }
 
-  /// `goesOn`: this process takes the next reading, too, and can do so without the file.
-  Status keep(bool goesOn) {
-    if (!collector_.hasWaiting()) return Done{};
-    // Write the state first: a kill before the values are kept then loses them. In the other order,
-    // the next reading would count them twice.
-    const Status left = writeCollectState(path_, boot_, collector_.state());
-    if (!left) {
-      if (!goesOn || !removeState()) return left;
-      if (!hasLostState_) {
-        context_.note(
-            format("%s; sampling goes on, but after a restart the first sample has no rates",
-                   left.error().message));
-      }
-    }
-    hasLostState_ = !left;
-    Status kept = collector_.keep();
-    if (!kept && !collector_.isInMemory()) restoreState();
-    return kept;
-  }
+  /// Fails when the state cannot be left to the next process.
+  Status keep() { return keep(nullptr); }
+  /// Keeps the values even then.
+  Status keepAtEnd() { return keep("the samples are kept, but the next process has no rates at first"); }
 
   /// As `keep`, but values that the store does not take wait for the next reading, up to an hour
   /// longer than others.
   Status keepOrWait(std::chrono::nanoseconds now) {
-    Status kept = keep(true);
+    Status kept = keep("sampling goes on, but after a restart the first sample has no rates");
     const bool waits = !kept && !collector_.isInMemory() && now - waitingSince_ < 2 * kLongestWait;
     if (waits && !isHeldUp_) {
       context_.note(
@@ -287,6 +279,35 @@ class SingleReadings {
  private:
   static constexpr std::chrono::hours kLongestWait{1};
 
+  // Locks the state as long as readings wait: another process would continue from the same state,
+  // and count what happened since then again. Where there can be no lock, there can be no state.
+  Status lock() {
+    const std::string path = path_ + ".lock";
+    auto lock = FileSystem().lockFile(
+        path, {.milliseconds = 2000,
+               .advice = "it may be a sampler whose samples wait for the store: stop it first"});
+    if (!lock) return FileSystem::status(path) ? Status(lock.error()) : Done{};
+    lock_ = *std::move(lock);
+    return Done{};
+  }
+
+  /// `withoutState`: what follows when the state cannot be written; null when nothing is kept then.
+  Status keep(const char* withoutState) {
+    if (!collector_.hasWaiting()) return Done{};
+    // Write the state first: a kill before the values are kept then loses them. In the other order,
+    // the next reading would count them twice.
+    const Status left = writeCollectState(path_, boot_, collector_.state());
+    if (!left) {
+      if (withoutState == nullptr || !removeState()) return left;
+      if (!hasLostState_) context_.note(format("%s; %s", left.error().message, withoutState));
+    }
+    hasLostState_ = !left;
+    Status kept = collector_.keep();
+    if (!kept && !collector_.isInMemory()) restoreState();
+    if (!collector_.hasWaiting()) lock_.reset();
+    return kept;
+  }
+
   // The next process, which lacks the values that wait, then adds their sums to its own. When that
   // fails, they are lost with this process.
   void restoreState() const {
@@ -294,9 +315,12 @@ class SingleReadings {
     if (!before || !writeCollectState(path_, boot_, *before)) removeState();
   }
 
-  // From an older reading, a later process would count again what is kept now.
+  // From an older reading, a later process would count again what is kept now. On a read-only file
+  // system, unlink does not say that there is no such file.
   bool removeState() const {
-    return unlink(path_.c_str()) == 0 || errno == ENOENT || errno == ENOTDIR;
+    struct stat status {};
+    return unlink(path_.c_str()) == 0 ||
+           (lstat(path_.c_str(), &status) != 0 && (errno == ENOENT || errno == ENOTDIR));
   }
 
   void startFromState(std::chrono::nanoseconds now) {
@@ -313,6 +337,7 @@ class SingleReadings {
   const std::string path_;
   const std::string boot_;
   Collector collector_;
+  Descriptor lock_;
   std::chrono::nanoseconds waitingSince_{};
   bool hasLostState_ = false;
   bool isHeldUp_ = false;  // by a store that takes no values
@@ -324,8 +349,8 @@ void collectOnce(ToolContext& context, const std::string& stateFile) {
   const auto recorder = openRecorder(context);
   if (!recorder) return context.fail(recorder.error().message);
   SingleReadings readings(context, **recorder, stateFile);
-  readings.take(std::chrono::steady_clock::now().time_since_epoch(), valueTimeNow());
-  const Status done = readings.keep(false);
+  Status done = readings.take(std::chrono::steady_clock::now().time_since_epoch(), valueTimeNow());
+  if (done) done = readings.keep();
   if (!done) context.fail(done.error().message);
 }
 
@@ -349,13 +374,13 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
        due = std::max(due + period, pace.now())) {
     const auto now = pace.now().time_since_epoch();
     const auto wallTime = pace.wallTime();
-    readings.take(now, valueTimeAt(wallTime));
-    if (!readings.mayWait(now + period, valueTimeAt(wallTime + period))) {
+    kept = readings.take(now, valueTimeAt(wallTime));
+    if (kept && !readings.mayWait(now + period, valueTimeAt(wallTime + period))) {
       kept = readings.keepOrWait(now);
     }
     isReplaced = lacksFolder && hasFolder();
   }
-  if (kept) kept = readings.keep(true);
+  if (kept) kept = readings.keepAtEnd();
   if (!kept) return context.fail(kept.error().message);
   if (isReplaced) {
     context.fail(format("%s is there now: start again to record in memory", folder));
