@@ -13,6 +13,7 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/folding_store.h"
 #include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/folding/unfolded_store.h"
 #include "platform/linux/live/live_machine.h"
 #include "platform/linux/locale/linux_date_formatting.h"
 #include "platform/linux/locale/linux_locale.h"
@@ -60,7 +61,9 @@ struct LinuxPlatform::Services {
       root, clock, preferences, log, limits::kStoreBusyMilliseconds, options.readOnly};
   SegmentFold fold{root, store, fileSystem, propertyLists, log};
   FoldingStore foldingStore{store, fold, log};
-  ReportedDays statistics{options.readOnly ? static_cast<StatisticsStore&>(store) : foldingStore};
+  UnfoldedStore unfoldedStore{root, store, fileSystem, propertyLists, log};
+  ReportedDays statistics{options.readOnly ? static_cast<StatisticsStore&>(unfoldedStore)
+                                           : foldingStore};
   FileSubmission submission{root,
                             {.files = fileSystem,
                              .propertyLists = propertyLists,
@@ -141,6 +144,9 @@ FileSubmission& LinuxPlatform::submission() {
 }
 SegmentFold& LinuxPlatform::fold() {
   return services_->fold;
+}
+const std::optional<std::string>& LinuxPlatform::missingValues() const {
+  return services_->unfoldedStore.missing();
 }
 RecordedRegistry& LinuxPlatform::registry() {
   return services_->drivers;

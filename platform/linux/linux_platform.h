@@ -10,6 +10,8 @@
 #pragma once
 
 #include <memory>
+#include <optional>
+#include <string>
 
 #include "platform/linux/files/device_root.h"
 #include "platform/platform.h"
@@ -29,7 +31,8 @@ struct LinuxPlatformOptions {
   SystemLog* log = nullptr;            // instead of the journal or standard error
   FileSystem* fileSystem = nullptr;    // writes files, instead of its own
   Preferences* preferences = nullptr;  // for the other services, instead of its own
-  /// A damaged store stays where it is, ECC events stay in their queue, nothing is folded.
+  /// A damaged store stays where it is, ECC events stay in their queue, nothing is folded: values
+  /// that wait are read where they are.
   bool readOnly = false;
 };
 
@@ -51,6 +54,8 @@ class LinuxPlatform {
   FileSubmission& submission();
   RecordedRegistry& registry();
   SqliteStore& store();
+  /// Which waiting values a read-only platform could not read, for people.
+  const std::optional<std::string>& missingValues() const;
 
  private:
   struct Services;

@@ -270,6 +270,22 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   for (const auto& reading : {"log preview --day 20000", "status", "stat list", "stat export"})
     EXPECT_EQ(device.run(reading).status, 1) << reading;
   EXPECT_EQ(device.files(), damaged);
+  // Neither fault hides the other.
+  const std::string noLog = "tavrelctl: " + none + "20000 (2024-10-04): ";
+  ASSERT_TRUE(outcome.error.starts_with(noLog)) << outcome;
+  for (const bool isMissing : {true, false}) {
+    std::filesystem::remove(device.path(kWhitelistFile));
+    if (!isMissing) device.write(kWhitelistFile, "junk");
+    const std::string fault =
+        isMissing ? "cannot read " + device.path(kWhitelistFile) +
+                        ": No such file or directory: write a whitelist, as docs/whitelist.md "
+                        "describes it\n"
+                  : device.path(kWhitelistFile) +
+                        ": not a property list: it begins neither with \"bplist00\" nor with "
+                        "\"<\": repair it, or replace it with another whitelist\n";
+    EXPECT_EQ(device.run("log preview --day 20000").error,
+              "tavrelctl: " + outcome.error.substr(noLog.size()) + noLog + fault);
+  }
 }
 
 TEST(LogList, SaysWhichLogCannotBeRead) {

@@ -24,6 +24,8 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
             }),
             0);
   std::ofstream(folder / "x.segment") << "no segment";
+  device.write(kWhitelistFile, xmlOf(R"({"G": {
+      "ScalarKeys": {"app.n": {}}, "DistributionKeys": {"app.t": {"intervals": [2]}}}})"));
   const Lines readings{"stat list app.t --day today", "stat show app.t", "stat show app.n",
                        "stat export", "stat export app.t --day today"};
   std::vector<Outcome> before;
@@ -35,6 +37,19 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   EXPECT_EQ(before[3].out.find("scalar\t2\tapp.old\t1\nscalar\t"), 0U) << before[3];
   EXPECT_EQ(device.run("stat show app.none").status, 1);
 
+  const auto preview = [&] {
+    std::string log = device.run("log preview --day today").out;
+    return log.erase(std::min(log.find("<date>"), log.size()), sizeof "<date>2026-11-27T11:16:25Z");
+  };
+  const std::string log = preview();
+  for (const char* key : {"<key>app.n</key>", "<key>app.t</key>"})
+    EXPECT_NE(log.find(key), std::string::npos) << log;
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
+  const Outcome rehearsed = device.run("rehearse --today");
+  EXPECT_NE(rehearsed.out.find(format("reads scalars of day %d: 1 row\n", today())),
+            std::string::npos)
+      << rehearsed;
+
   const Outcome folded = device.run("stat fold");
   EXPECT_EQ(folded.out, "1 segment: 1 scalar, 2 values; 1 removed\nrefused: 0 values, 1 file\n");
   EXPECT_EQ(folded.error, "tavrelctl: \"x.segment\" in " + folder.string() +
@@ -45,6 +60,7 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
       EXPECT_EQ(device.run(readings[i]), before[i]) << readings[i];
     }
   }
+  EXPECT_EQ(preview(), log);
   EXPECT_EQ(device.json("stat fold"),
             R"({"format_version": 1, "segments": 0, "scalars": 0, "values": 0, "removed": 0,
                 "waiting": 0, "dropped": 0, "refused": 0, "segments_refused": 0})"_json);

@@ -6,6 +6,26 @@
 #include "tools/overlay/overlay_platform.h"
 
 namespace tavrel {
+namespace {
+
+// Says why there is no log, and takes what the daemon logged about that from the errors.
+void explainAbsence(ToolContext& context, std::string_view lastError, LogOutcome outcome,
+                    LogPreview& preview) {
+  preview.lacksWhitelist = outcome == LogOutcome::NoWhitelist;
+  if (preview.lacksWhitelist) {
+    // The daemon's own lines do not say where the whitelist is, or what to do.
+    preview.reason = whitelistState(context).fault;
+    std::erase_if(preview.errors, [&](const std::string& error) {
+      return error == "Couldn't load whitelist" || preview.reason.starts_with(error) ||
+             error.starts_with("Couldn't parse the contents of the config file.");
+    });
+    return;
+  }
+  preview.reason = lastError.empty() ? whyNoLog(outcome) : lastError;
+  std::erase(preview.errors, preview.reason);
+}
+
+}  // namespace
 
 LogPreview previewLog(
     ToolContext& context, std::int32_t day,
@@ -25,17 +45,10 @@ LogPreview previewLog(
   const LogOutcome outcome = BHReport(overlay.platform()).writeLogForYesterday(day, {});
   if (!overlay.logs().empty()) {
     preview.log = overlay.logs().back();
-    return preview;
+  } else {
+    explainAbsence(context, overlay.lastError(), outcome, preview);
   }
-  preview.reason = overlay.lastError();
-  if (preview.reason.empty()) preview.reason = whyNoLog(outcome);
-  if (!preview.errors.empty()) preview.errors.pop_back();
-  preview.lacksWhitelist = outcome == LogOutcome::NoWhitelist;
-  if (preview.lacksWhitelist) {
-    // The daemon's own lines do not say where the whitelist is, or what to do.
-    std::erase(preview.errors, "Couldn't load whitelist");
-    preview.reason = whitelistState(context).fault;
-  }
+  if (overlay.missingValues()) preview.errors.push_back(*overlay.missingValues());
   return preview;
 }
 

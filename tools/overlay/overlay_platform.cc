@@ -104,6 +104,10 @@ const std::vector<CapturedLog>& OverlayPlatform::logs() const {
   return services_->submission.logs;
 }
 
+const std::optional<std::string>& OverlayPlatform::missingValues() const {
+  return services_->below.missingValues();
+}
+
 std::string_view OverlayPlatform::lastError() const {
   return services_->log.lastError;
 }

@@ -10,6 +10,7 @@
 #pragma once
 
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -37,6 +38,8 @@ class OverlayPlatform {
   void replaceFile(std::string path, std::string content);
 
   const std::vector<CapturedLog>& logs() const;
+  /// Which values that wait to be folded could not be read, for people.
+  const std::optional<std::string>& missingValues() const;
   /// The last entry at error level; empty when there was none.
   std::string_view lastError() const;
 

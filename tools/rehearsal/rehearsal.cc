@@ -37,7 +37,7 @@ Rehearsal rehearse(LinuxPlatform& device, RehearsedRun run) {
   const std::optional<LogOutcome> outcome = run == RehearsedRun::Gated
                                                 ? runDailyIfNeeded(platform, {}, onStep)
                                                 : dailyTasksForDay(platform, day, {}, onStep);
-  return {day, std::move(recorder.steps), outcome};
+  return {day, std::move(recorder.steps), outcome, overlay.missingValues()};
 }
 
 }  // namespace tavrel

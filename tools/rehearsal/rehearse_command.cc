@@ -283,6 +283,7 @@ void addRehearseCommand(Command app, ToolContext& context) {
       print(context, rehearsal, run, arguments->verbose);
     }
     failOnErrors(context, rehearsal);
+    if (rehearsal.missingValues) context.fail(*rehearsal.missingValues);
   });
 }
 
