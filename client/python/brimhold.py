@@ -157,6 +157,16 @@ class Distribution:
         return Timer(self, milliseconds=milliseconds)
 
 
+_NO_GENERATOR = "a timer measures no generator: use it in a with statement"
+_GENERATORS = (
+    collections.abc.Generator,
+    collections.abc.AsyncGenerator,
+    # What these two make has no public name.
+    type(contextlib.contextmanager(lambda: iter(()))()),
+    type(contextlib.asynccontextmanager(lambda: None)()),  # type: ignore[arg-type,return-value]
+)
+
+
 class Timer:
     """Measures how long a block or a function takes, on the monotonic clock, in seconds or
     milliseconds. A block that raises is recorded too.
@@ -222,7 +232,7 @@ class Timer:
             except BaseException:
                 self._record(started)
                 raise
-            # Not each function that returns one of these is known by its own kind.
+            # A decorator or an object with __call__ hides what kind of function is called.
             if isinstance(result, collections.abc.Coroutine):
                 return result_of(result)
             if isinstance(result, _GENERATORS):
@@ -239,13 +249,3 @@ class Timer:
             else _library.BHClientTimerStopSeconds
         )
         stop(started, self._distribution._handle)
-
-
-_NO_GENERATOR = "a timer measures no generator: use it in a with statement"
-_GENERATORS = (
-    collections.abc.Generator,
-    collections.abc.AsyncGenerator,
-    # What these two make has no public name.
-    type(contextlib.contextmanager(lambda: iter(()))()),
-    type(contextlib.asynccontextmanager(lambda: None)()),  # type: ignore[arg-type,return-value]
-)

@@ -114,7 +114,7 @@ TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
         "tavrel-collect 1\nboot boot-2\nat 9000000000000000000\ncpu 0 0\nend\n");
   EXPECT_EQ(outputOf(once), "");
   EXPECT_EQ(sums(), "com.norvane.usage.cpu.busy_milliseconds=70 samples=15");
-  EXPECT_TRUE(outputOf(once + " --state " + root.string(), 1).ends_with("Is a directory\n"));
+  EXPECT_TRUE(outputOf(once + " --state " + folder.string(), 1).ends_with("Is a directory\n"));
 }
 
 TEST_F(Programs, TheSamplerEndsWhenItsFileIsRemoved) {
@@ -189,8 +189,6 @@ for wrong in (lambda: count.add(2**63), lambda: count.add(1.5), lambda: series.r
     try: wrong()
     except Exception as error: print(type(error).__name__, end=' ')
 print(brimhold.status(), flush=True)
-if os.fork() == 0: count.add(30)
-else: os.wait()
 # In another process, the addresses of this one mean nothing.
 subprocess.run([sys.executable, '-B', '-c', """
 import brimhold, pickle, sys
@@ -199,6 +197,8 @@ scalar, record, timer = pickle.load(sys.stdin.buffer)
 scalar.add(10); record(2)
 with timer: pass
 """], input=pickle.dumps((count, series.record, timed.timer(milliseconds=True))), check=True)
+if os.fork() == 0: count.add(30)
+else: os.wait()
 )";
   setenv("PROGRAM", program.c_str(), 1);
   EXPECT_EQ(outputOf(kPython + "PYTHONPATH=" TAVREL_SOURCE "/client/python "
@@ -212,8 +212,8 @@ with timer: pass
   EXPECT_EQ(records["py.series"], (std::vector<double>{1, 2}));
   EXPECT_EQ(records["py.timed"].size(), 6U);
   ASSERT_EQ(records["py.hidden"].size(), 2U);
-  for (const double seconds : records["py.hidden"])
-    EXPECT_GE(seconds, 0.01);
+  for (const double measured : records["py.hidden"])
+    EXPECT_GE(measured, 0.01);
 }
 
 }  // namespace

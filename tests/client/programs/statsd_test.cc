@@ -196,6 +196,7 @@ TEST_F(Statsd, EndsWhenItsFileIsRemoved) {
       "the process's file in /run/tavrel/stat has been removed: values are lost until the process "
       "is restarted";
   run([&] {
+    add(1);
     RecordingWatch watch([](std::string_view why) { FAIL() << why; });
     RecordingWatch::Ticks now{};
     EXPECT_TRUE(watch.lookAt(now));
