@@ -184,7 +184,7 @@ TEST(Plist, ConvertsBetweenAllForms) {
   device.check("plist show -",
                fails("standard input: not JSON at column 4: unexpected end of input"), "[1,");
   device.check("plist show -",
-               fails("standard input: not JSON at line 2, column 2: invalid literal"), "[1,\nx]");
+               fails("standard input: not JSON at line 2, column 1: invalid literal"), "[1,\nx]");
 }
 
 // A whitelist, and a day's statistics including one scalar that may not leave.

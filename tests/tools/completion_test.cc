@@ -141,9 +141,9 @@ TEST(CompletionTest, MakesThePageOfATemplate) {
   EXPECT_TRUE(page.out.starts_with(
       ".SH COMMANDS\n.TP\n\\fBsend force\\fR \\fIDAY\\fR\n.TQ\n\\fBsend deliver\\fR \\fIFILE\\fR\n"
       "Prose.\n.TP\n\\fBplist convert\\fR [\\fB\\-\\-to\\fR \\fBxml\\fR|\\fBbinary\\fR|"
-      "\\fBjson\\fR] [\\fB\\-\\-output\\fR \\fIOUTPUT\\fR] \\fIFILE\\fR\nMore.\n.RS\n.TP\n"
+      "\\fBjson\\fR] [\\fB\\-\\-output\\fR \\fIFILE\\fR] \\fIFILE\\fR\nMore.\n.RS\n.TP\n"
       "\\fB\\-\\-to\\fR \\fBxml\\fR|\\fBbinary\\fR|\\fBjson\\fR\nThe form to write.\n.TP\n"
-      "\\fB\\-o\\fR, \\fB\\-\\-output\\fR \\fIOUTPUT\\fR\nFile to write, in one step; \\- is "
+      "\\fB\\-o\\fR, \\fB\\-\\-output\\fR \\fIFILE\\fR\nFile to write, in one step; \\- is "
       "standard output.\n.RE\n.SS The rest\n.TP\n\\fBstatus\\fR"))
       << page;
   EXPECT_TRUE(page.out.ends_with(".SH END\n")) << page;

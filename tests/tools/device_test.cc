@@ -57,7 +57,9 @@ TEST(Send, ChecksApplicationsBeforeItSends) {
   const std::string good = R"("bundle_id": "a", "version": "1", "orbo_id": 1, "arch": 1)";
   const TemporaryDevice device;
   const std::vector<std::pair<std::string, std::string>> cases = {
-      {"{}", "not an array of applications"},
+      {"{}",
+       "not an array of applications: give dictionaries with \"bundle_id\", \"version\" and "
+       "\"uuid\""},
       {"[1]", "element 0 is not a dictionary"},
       {R"([{"version": "1"}])", "application 0: \"bundle_id\" must be a string"},
       {R"([{"bundle_id": "a", "version": "1", "orbo_id": 1.5}])",

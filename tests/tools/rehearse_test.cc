@@ -213,7 +213,9 @@ TEST(Rehearse, SaysWhyNothingIsSentOn) {
   EXPECT_EQ(sentOn(), "  would send on the pending logs");
   const std::string kPermission = "/var/mobile/Library/Preferences/com.norvane.zentrix.plist";
   device.write(kPermission, "damaged");
-  EXPECT_EQ(sentOn().find("  would send on nothing: cannot read " + device.path(kPermission)), 0U)
+  EXPECT_EQ(
+      sentOn().find("  would send on nothing: cannot read preferences " + device.path(kPermission)),
+      0U)
       << sentOn();
   device.run("deny");
   EXPECT_EQ(sentOn(), "  would send on nothing: submission is not allowed");
