@@ -14,24 +14,26 @@ class UnfoldedStore::History final : public BHHistory {
  public:
   explicit History(UnfoldedStore& store) : store_(store) {}
 
-  void scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override {
     auto rows = open(prefix, minDaysSince1970, maxDaysSince1970, false);
-    if (!rows) return;
+    if (!rows) return !hasFailed_;
     if (Status walked = rows->walkScalars(rowHandler); !walked) fail(walked.error());
+    return !hasFailed_;
   }
 
-  void distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
+  bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override {
     auto rows = open(prefix, minDaysSince1970, maxDaysSince1970, true);
-    if (!rows) return;
+    if (!rows) return !hasFailed_;
     const Status walked =
         rows->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
                                     BHHistoryDistributionEnumerator& values,
                                     bool& stop) { rowHandler(key, day, values, stop); });
     if (!walked) fail(walked.error());
+    return !hasFailed_;
   }
 
  private:
