@@ -4,9 +4,8 @@
 // an array of prefixes.
 //
 //  - Root records any key.
-//  - Of the listed prefixes of a key, the longest decides: only its users may record the key. A
-//  user
-//    that does not exist reserves prefixes, too.
+//  - Of the listed prefixes of a key, the longest decides: only its users may record the key, and
+//    nobody but root while they do not exist.
 //  - Anybody may record a key without a listed prefix, except listed users, who keep to theirs.
 //  - Keys that begin with "com.norvane." are the system's: a user needs a listed prefix that begins
 //    with it.
