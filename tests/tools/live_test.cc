@@ -67,10 +67,13 @@ struct LiveDevice : TemporaryDevice {
       if (channel.contains("value")) text += channel["value"].dump();
       for (const auto& value : channel.value("values", nlohmann::json::array()))
         text += (value.is_null() ? "-" : value.dump()) + ',';
+      bool hasTime = !channel.contains("states");
       for (const auto& state : channel.value("states", nlohmann::json::array())) {
+        hasTime = hasTime || state["current"] == true;
         text += state["name"].get<std::string>() + ':' + state["in_transitions"].dump() + '/' +
                 state["residency"].dump() + (state["current"] == true ? "* " : " ");
       }
+      EXPECT_EQ(channel["timestamp"].is_null(), !hasTime);
       text += ' ';
     }
     return text;

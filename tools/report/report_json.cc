@@ -1,5 +1,6 @@
 #include "tools/report/report_json.h"
 
+#include <algorithm>
 #include <optional>
 #include <string_view>
 
@@ -131,9 +132,13 @@ void writeSample(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
   const std::uint8_t form = IOReportChannelGetFormat(channel);
   const Elements elements = getRawElements(channel, form);
   json.member("timestamp");
-  // The delta of a simple channel keeps the earlier time, which says nothing about the delta.
-  if (elements && !(isDelta && form == kFormatSimple)) {
-    json.integer(elements.timestamp(0));
+  std::uint64_t timestamp = 0;
+  for (std::size_t i = 0; i < elements.count(); ++i)
+    timestamp = std::max(timestamp, elements.timestamp(i));
+  // The delta of a simple channel keeps the earlier time, which says nothing about the delta. Of
+  // live states only the current one has a time.
+  if (timestamp != 0 && !(isDelta && form == kFormatSimple)) {
+    json.integer(timestamp);
   } else {
     json.null();
   }
