@@ -38,7 +38,10 @@ bool checkKey(ToolContext& context, const std::string& key) {
 template <Status (ValueRecorder::*operation)(ValueTime, const std::string&, std::int64_t)>
 void changeScalar(ToolContext& context, const Arguments& arguments) {
   if (!checkKey(context, arguments.key)) return;
-  const auto number = parseNumber<std::int64_t>(arguments.number);
+  // "+5" means what it means for a distribution.
+  std::string_view text = arguments.number;
+  if (text.starts_with('+') && !text.starts_with("+-")) text.remove_prefix(1);
+  const auto number = parseNumber<std::int64_t>(text);
   if (!number) {
     return context.failUsage(format("not a 64-bit integer: %s", arguments.number));
   }

@@ -22,7 +22,7 @@ class Programs : public Recording {
 };
 
 TEST_F(Programs, TheToolRecordsIntoMemory) {
-  EXPECT_EQ(outputOf(kTool + "stat add n 2"), "");
+  EXPECT_EQ(outputOf(kTool + "stat add n +2"), "");
   EXPECT_EQ(outputOf(kTool + "--root " + root.string() + " stat add n 3"), "");
   EXPECT_EQ(outputOf(kTool + "stat set com.norvane.g -7"), "");
   EXPECT_EQ(outputOf(kTool + "stat record d -- 1.5 -2"), "");
