@@ -261,7 +261,9 @@ class SingleReadings {
   /// Fails when the state cannot be left to the next process.
   Status keep() { return keep(nullptr); }
   /// Keeps the values even then.
-  Status keepAtEnd() { return keep("the samples are kept, but the next process has no rates at first"); }
+  Status keepAtEnd() {
+    return keep("the samples are kept, but the next process has no rates at first");
+  }
 
   /// As `keep`, but values that the store does not take wait for the next reading, up to an hour
   /// longer than others.
