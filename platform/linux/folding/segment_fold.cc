@@ -63,9 +63,6 @@ class FoldRun {
  private:
   Status fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing);
   Status take(SqliteBatch& batch, const SegmentEntry& entry);
-  void refuse(const SegmentEntry& entry, const std::string& line);
-  /// After a read of the segment: when its user has too many, others come before it next time.
-  void passOn(const SegmentEntry& entry);
   Status takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReader& reader,
                     const SegmentName& name, bool isWriterGone);
   /// The position as stored, and decoded. Nothing when no fold of this version can go on from it.
@@ -172,22 +169,13 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
   return own.giveTo(batch);
 }
 
-void FoldRun::passOn(const SegmentEntry& entry) {
-  if (unseen_.contains(entry.owner)) folder_.putBehindOthers(entry);
-}
-
-void FoldRun::refuse(const SegmentEntry& entry, const std::string& line) {
-  notes_.refuse(line);
-  passOn(entry);
-}
-
 Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   auto opening = folder_.openSegment(entry);
   if (!opening) return opening.error();
   if (!opening->segment) {
     if (opening->refusal.empty()) return Done{};
     unseen_.insert(entry.owner);
-    refuse(entry, opening->refusal);
+    notes_.refuse(opening->refusal);
     return Done{};
   }
   OpenSegment& segment = *opening->segment;
@@ -199,18 +187,17 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state) {
-    refuse(entry, folder_.refusal(entry.name, state.error().message));
+    notes_.refuse(folder_.refusal(entry.name, state.error().message));
     return Done{};
   }
   if (*state == SegmentReader::State::Empty) {
-    passOn(entry);
     if (isWriterGone) folded_.push_back({{}, std::move(segment), {}, true});
     return Done{};
   }
   // Read again: at the first read, the process may not have written them yet.
   const SegmentName name{owner, reader.facts().identity};
   if (!found_.insert(name).second) {
-    refuse(entry, folder_.refusal(entry.name, "a copy of another segment"));
+    notes_.refuse(folder_.refusal(entry.name, "a copy of another segment"));
     return Done{};
   }
   if (!admit(name)) {
@@ -263,7 +250,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     if (isWriterGone) {
       folded_.push_back({name, std::move(segment), {}, true});
     } else {
-      refuse(segment.entry, folder_.refusal(segment.entry.name, "a copy of another segment"));
+      notes_.refuse(folder_.refusal(segment.entry.name, "a copy of another segment"));
     }
     return Done{};
   }
@@ -286,7 +273,6 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   if (isOver) position = SegmentPosition::end();
   if (Status done = positions_.store(batch, name, before, position.encode()); !done) return done;
   count(name, intake, progress);
-  passOn(segment.entry);
   // The acknowledgement tells a program that dropped values that there may be room again.
   if (isOver || !progress.acknowledgements.empty() || progress.dropped > 0) {
     folded_.push_back({name, std::move(segment), std::move(progress), isOver});

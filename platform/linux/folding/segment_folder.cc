@@ -2,11 +2,10 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <compare>
 #include <cstdio>
 #include <fcntl.h>
 #include <linux/magic.h>
-#include <span>
+#include <random>
 #include <sys/vfs.h>
 #include <unistd.h>
 
@@ -43,57 +42,27 @@ const char* faultOf(const struct stat& status, dev_t device) {
   return nullptr;
 }
 
-// A segment, ordered by how long it has waited: a fold that reads one puts it behind the others.
-struct Waiting {
-  std::int64_t seconds;
-  std::int64_t nanoseconds;
-  std::string name;
-  auto operator<=>(const Waiting&) const = default;
-};
-
-// The segments of one user that have waited longest, at most `limits::kSegmentsPerUser`.
-class LongestWaiting {
+/// A random choice of at most `most` of the elements offered.
+template <class Element>
+class Sample {
  public:
-  void offer(Waiting segment) {
+  explicit Sample(std::size_t most) : most_(most) {}
+
+  template <class Random>
+  void offer(Element element, Random& random) {
     ++offered_;
-    heap_.push_back(std::move(segment));
-    std::push_heap(heap_.begin(), heap_.end());
-    if (heap_.size() > limits::kSegmentsPerUser) {
-      std::pop_heap(heap_.begin(), heap_.end());
-      heap_.pop_back();
-    }
+    if (chosen_.size() < most_) return chosen_.push_back(std::move(element));
+    const std::uint64_t place = random() % offered_;
+    if (place < most_) chosen_[static_cast<std::size_t>(place)] = std::move(element);
   }
-  std::uint64_t offered() const { return offered_; }
-  std::size_t size() const { return heap_.size(); }
-  // In order. Ends the choice.
-  std::vector<Waiting>& sorted() {
-    std::sort_heap(heap_.begin(), heap_.end());
-    return heap_;
-  }
+  std::vector<Element>& chosen() { return chosen_; }
+  std::uint64_t leftOut() const { return offered_ - chosen_.size(); }
 
  private:
+  std::size_t most_;
   std::uint64_t offered_ = 0;
-  std::vector<Waiting> heap_;
+  std::vector<Element> chosen_;
 };
-
-// Adds to the listing, of each user, those that have waited longest. Users with few segments get
-// all of them read; the others share what is left of the total.
-void choose(std::map<std::uint32_t, LongestWaiting>& byOwner, SegmentFolder::Listing& listing) {
-  std::vector<std::pair<std::size_t, std::uint32_t>> owners;
-  for (const auto& [owner, segments] : byOwner)
-    owners.emplace_back(segments.size(), owner);
-  std::sort(owners.begin(), owners.end());
-  std::size_t left = limits::kSegments;
-  for (std::size_t i = 0; i < owners.size(); ++i) {
-    const auto [size, owner] = owners[i];
-    const std::size_t count = std::min(size, left / (owners.size() - i));
-    left -= count;
-    LongestWaiting& segments = byOwner[owner];
-    if (segments.offered() > count) listing.leftOut[owner] = segments.offered() - count;
-    for (Waiting& segment : std::span(segments.sorted()).first(count))
-      listing.segments.push_back({std::move(segment.name), owner});
-  }
-}
 
 }  // namespace
 
@@ -128,7 +97,8 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
       listing.refusals.push_back(refusal(name, reason));
     }
   };
-  std::map<std::uint32_t, LongestWaiting> byOwner;
+  std::minstd_rand random(std::random_device{}());
+  std::map<std::uint32_t, Sample<std::string>> byOwner;
   std::size_t entries = 0;
   const int code = walkFolder(folder_, [&](const dirent& entry) {
     const std::string_view name = entry.d_name;
@@ -156,13 +126,25 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
       if (S_ISREG(status.st_mode)) listing.linked.insert(status.st_uid);
       return true;
     }
-    byOwner[status.st_uid].offer(
-        {status.st_mtim.tv_sec, status.st_mtim.tv_nsec, std::string(name)});
+    byOwner.try_emplace(status.st_uid, limits::kSegmentsPerUser)
+        .first->second.offer(std::string(name), random);
     return true;
   });
   // What is not seen would pass for gone.
   if (code != 0) return systemError("list", path_, code);
-  choose(byOwner, listing);
+  Sample<SegmentEntry> all(limits::kSegments);
+  std::map<std::uint32_t, std::uint64_t> chosen;
+  for (auto& [owner, names] : byOwner) {
+    for (std::string& name : names.chosen())
+      all.offer({std::move(name), owner}, random);
+  }
+  listing.segments = std::move(all.chosen());
+  for (const SegmentEntry& entry : listing.segments)
+    ++chosen[entry.owner];
+  for (auto& [owner, names] : byOwner) {
+    const std::uint64_t offered = names.chosen().size() + names.leftOut();
+    if (offered > chosen[owner]) listing.leftOut[owner] = offered - chosen[owner];
+  }
   std::sort(listing.segments.begin(), listing.segments.end(),
             [](const SegmentEntry& a, const SegmentEntry& b) { return a.name < b.name; });
   return listing;
@@ -204,10 +186,6 @@ Descriptor SegmentFolder::openToAcknowledge(const OpenSegment& segment) const {
     return {};
   }
   return file;
-}
-
-void SegmentFolder::putBehindOthers(const SegmentEntry& entry) const {
-  utimensat(folder_.get(), entry.name.c_str(), nullptr, AT_SYMLINK_NOFOLLOW);
 }
 
 bool SegmentFolder::remove(const OpenSegment& segment) const {

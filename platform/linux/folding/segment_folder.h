@@ -53,8 +53,8 @@ class SegmentFolder {
 
   struct Listing {
     std::vector<SegmentEntry> segments;  // by name: those that began earlier come first
-    /// Segments that were left out, by owner. When there are too many, those that have waited
-    /// longest are listed, so that each gets its turn and sets are folded in their order.
+    /// Segments that were left out, by owner. When there are too many, a random choice is listed,
+    /// so that each gets its turn.
     std::map<std::uint32_t, std::uint64_t> leftOut;
     /// Owners of files that are refused only while they have several names (hard links).
     std::set<std::uint32_t> linked;
@@ -70,8 +70,6 @@ class SegmentFolder {
   Expected<SegmentOpening> openSegment(const SegmentEntry& entry) const;
   /// Opens the same file for writing.
   Descriptor openToAcknowledge(const OpenSegment& segment) const;
-  /// Lets all segments of the user that wait have their turn before this one has another.
-  void putBehindOthers(const SegmentEntry& entry) const;
   /// Removes the name, unless it belongs to another file by now.
   bool remove(const OpenSegment& segment) const;
 
