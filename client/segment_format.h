@@ -24,10 +24,9 @@
  * Cells. A cell holds one scalar of one day, or of one second since boot while undated. kBHCellKey
  * is stored last; 0 means unused. The current slot is kBHCellSlots[sets & 1]: adds go to it. A set
  * writes value and time into the other slot and then advances kBHCellSets, so the slot is valid if
- * the number of sets was the same before and after it was read. A reader remembers (start, sets,
- * value) of each cell. If the number of sets is the same, the difference of the values is an add;
- * otherwise the value is a set. A cell with a start that the reader has not seen has been added to,
- * even if the difference is 0.
+ * the number of sets was the same before and after it was read. A reader remembers (sets, value) of
+ * each cell. If the number of sets is the same, the difference of the values is an add; otherwise
+ * the value is a set.
  *   A cell never goes back to zero. Once its day is over the process makes kBHCellCloses odd; a
  * reader that saw it odd *before* it read the value, and has folded that value durably, writes the
  * kBHCellCloses that it saw to kBHCellAcknowledged. Only then may the process give the cell another

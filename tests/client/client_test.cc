@@ -210,52 +210,6 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
   EXPECT_TRUE(segments().empty());
 }
 
-TEST_F(Recording, AnAddOfNothingLeavesAValueEachDay) {
-  constexpr int kDays = 4;  // from the third on, cells are reused
-  const pid_t child = start([] {
-    for (int day = 0; day < kDays; ++day) {
-      testClock().realtime = (kToday + day) * 86'400;
-      for (const std::int64_t amount : {0, day, -day})
-        add(amount);
-      kill(getpid(), SIGSTOP);
-    }
-  });
-  Scalars expected;
-  for (int day = 0; day < kDays; ++day) {
-    waitpid(child, nullptr, WUNTRACED);
-    fold();
-    expected[{"count", kToday + day}] = 0;
-    EXPECT_EQ(scalars, expected);
-    scalars.erase({"count", kToday - 1 + day});  // as when days are removed
-    expected.erase({"count", kToday - 1 + day});
-    kill(child, SIGCONT);
-  }
-  EXPECT_EQ(waitFor(child), 0);
-  fold();
-  EXPECT_EQ(scalars, expected);
-}
-
-TEST_F(Recording, PositionsOfTheFirstReleaseAreReadOn) {
-  const pid_t child = start([] {
-    add(5);
-    kill(getpid(), SIGSTOP);
-    add(2);
-  });
-  waitpid(child, nullptr, WUNTRACED);
-  fold();
-  std::string& position = positions.begin()->second;
-  EXPECT_EQ(position.size(), 24U + 28U);
-  position[0] = 2;
-  position.erase(28, 8);  // the start of the cell's day
-  scalars.clear();
-  fold();
-  EXPECT_EQ(scalars, Scalars());
-  kill(child, SIGCONT);
-  EXPECT_EQ(waitFor(child), 0);
-  fold();
-  EXPECT_EQ(scalars, (Scalars{{{"count", kToday}, 2}}));
-}
-
 TEST_F(Recording, WithoutFreshCellsEachScalarKeepsOne) {
   const pid_t child = start([] {
     testClock().realtime = 1000;
@@ -608,7 +562,7 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
                  "256 KiB of names that a process may have");
   });
   fold();
-  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 3});  // "a" and "b" leave nothing
+  EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4});  // "a", "b" and 0 leave nothing
   EXPECT_EQ(scalar(std::string(1024, 'k').c_str()), 4);
   EXPECT_EQ(scalar("4000"), 4000);
   EXPECT_EQ(records, (decltype(records){{border, {1}}}));

@@ -349,7 +349,7 @@ TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
                  " wait: what must be remembered of segments that are in use exceeds 1 MiB; record "
                  "fewer keys, or from fewer programs at a time"};
   for (int fold = 0; fold < 2; ++fold, expected.clear()) {
-    EXPECT_EQ(foldNow().waiting, 5U);  // each position has 229,400 bytes, of 1 MiB
+    EXPECT_EQ(foldNow().waiting, 3U);  // each position has 163,864 bytes, of 1 MiB
     EXPECT_EQ(log.lines, expected);
   }
   writers.clear();

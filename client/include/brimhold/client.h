@@ -63,8 +63,7 @@ typedef struct BHClientDistributionKey BHClientDistributionKey;
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 
-/* Adds to today's value, which starts at 0: an add of 0 shows that the program has run. Sums wrap
- * in two's complement. */
+/* Adds to today's value, which starts at 0. Sums wrap in two's complement. */
 BH_CLIENT_PUBLIC void BHClientScalarAdd(BHClientScalarKey* key, int64_t amount);
 /* Replaces today's value, except what other processes have added since the last fold. */
 BH_CLIENT_PUBLIC void BHClientScalarSet(BHClientScalarKey* key, int64_t value);

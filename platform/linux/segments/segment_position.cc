@@ -9,14 +9,12 @@ namespace tavrel {
 namespace {
 
 // Layout, little-endian: u32 version, u32 cells, u32 chunks, u32 zero, u64 dropped, then the used
-// cells and chunks, each as its u32 number, ascending, and its fields in order. In version 2 cells
-// have no start. The position at a segment's end is only the version `kEndVersion`.
-constexpr std::uint32_t kVersionWithoutStarts = 2;
+// cells and chunks, each as its u32 number, ascending, and its fields in order. The position at a
+// segment's end is only the version `kEndVersion`.
+constexpr std::uint32_t kVersion = 2;
 constexpr std::uint32_t kEndVersion = 3;
-constexpr std::uint32_t kVersion = 4;
 constexpr std::size_t kHeadBytes = 24;
-constexpr std::size_t kStartBytes = 8;
-constexpr std::size_t kCellBytes = 20 + kStartBytes;
+constexpr std::size_t kCellBytes = 20;
 constexpr std::size_t kChunkBytes = 12;
 
 template <class Word>
@@ -61,7 +59,6 @@ std::string SegmentPosition::encode() const {
     const Cell& cell = cells[number];
     if (cell == Cell{}) continue;
     append(out, number);
-    append(out, cell.start);
     append(out, cell.sets);
     append(out, static_cast<std::uint64_t>(cell.value));
   }
@@ -85,27 +82,19 @@ Expected<SegmentPosition> SegmentPosition::decode(std::string_view text) {
   if (bytes.size() == sizeof kEndVersion && loadLittle32(bytes, 0) == kEndVersion) return end();
   const std::uint32_t usedCells = loadLittle32(bytes, 4).value_or(0);
   const std::uint32_t usedChunks = loadLittle32(bytes, 8).value_or(0);
-  const bool hasStarts = loadLittle32(bytes, 0) == kVersion;
-  if ((!hasStarts && loadLittle32(bytes, 0) != kVersionWithoutStarts) || usedCells > kBHCellCount ||
-      usedChunks > kBHChunkCount) {
+  if (loadLittle32(bytes, 0) != kVersion || usedCells > kBHCellCount ||
+      usedChunks > kBHChunkCount || bytes.size() != bytesOf(usedCells, usedChunks)) {
     return refused;
   }
-  const std::size_t startBytes = hasStarts ? kStartBytes : 0;
-  const std::size_t missing = usedCells * (kStartBytes - startBytes);
-  if (bytes.size() != bytesOf(usedCells, usedChunks) - missing) return refused;
   SegmentPosition position;
   position.isKnown = true;
   position.dropped = *loadLittle64(bytes, 16);
   std::uint64_t at = kHeadBytes;
-  for (std::uint32_t i = 0; i < usedCells; ++i) {
+  for (std::uint32_t i = 0; i < usedCells; ++i, at += kCellBytes) {
     Cell* const cell = nextPart(position.cells, bytes, at, kBHCellCount);
     if (cell == nullptr) return refused;
-    at += 4;
-    cell->start = hasStarts ? *loadLittle64(bytes, at) : kUnknownStart;
-    at += startBytes;
-    cell->sets = *loadLittle64(bytes, at);
-    cell->value = static_cast<std::int64_t>(*loadLittle64(bytes, at + 8));
-    at += 16;
+    *cell = {*loadLittle64(bytes, at + 4),
+             static_cast<std::int64_t>(*loadLittle64(bytes, at + 12))};
   }
   for (std::uint32_t i = 0; i < usedChunks; ++i, at += kChunkBytes) {
     Chunk* const chunk = nextPart(position.chunks, bytes, at, kBHChunkCount);

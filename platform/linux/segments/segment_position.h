@@ -1,7 +1,7 @@
 // How far a segment has been folded. A store remembers this with the values that it took, so that
 // each is taken once.
 //
-// An encoded position holds only what was folded of the segment, 28 bytes per cell and 12 per
+// An encoded position holds only what was folded of the segment, 20 bytes per cell and 12 per
 // chunk; claims of its header and refused values take no space. A fold bounds the bytes of each
 // user's positions. A segment that was folded to its end, and to which nobody can write, needs no
 // more than a mark.
@@ -17,12 +17,8 @@
 namespace tavrel {
 
 struct SegmentPosition {
-  /// The start of cells in positions of earlier releases, which did not store it.
-  static constexpr std::uint64_t kUnknownStart = ~std::uint64_t{0};
-
-  /// The folded part of a scalar's cell, and the day that it had.
+  /// The folded part of a scalar's cell.
   struct Cell {
-    std::uint64_t start = 0;
     std::uint64_t sets = 0;
     std::int64_t value = 0;
     bool operator==(const Cell&) const = default;
@@ -48,7 +44,7 @@ struct SegmentPosition {
   std::string encode() const;
   /// The size in bytes of a position with that many parts.
   static std::size_t bytesOf(std::size_t cells, std::size_t chunks);
-  /// Without unused parts at the ends. Refuses bytes that no release's `encode` wrote.
+  /// Without unused parts at the ends. Refuses bytes that `encode` did not write.
   static Expected<SegmentPosition> decode(std::string_view bytes);
 };
 

@@ -115,12 +115,6 @@ std::uint64_t markIn(ByteSpan chunk, std::uint32_t record) {
   return *loadNative64(chunk, kBHChunkFirst + std::uint64_t{record} * kBHRecordBytes + 8);
 }
 
-// Whether the cell serves another day than when it was folded, or was never folded. Then it has a
-// value of that day, which may be 0.
-bool isNewDay(const CellLook& look, const SegmentPosition::Cell& folded) {
-  return look.start != folded.start && folded.start != SegmentPosition::kUnknownStart;
-}
-
 bool awaitsAcknowledgement(const CellLook& look) {
   return look.closes % 2 != 0 && look.acknowledged != look.closes;
 }
@@ -244,8 +238,7 @@ void SegmentReader::readCells(Reading& reading) {
     for (std::uint32_t i = first; i < std::min(first + kAtOnce, cells); ++i) {
       const CellLook look = cellIn(bytes, std::uint64_t{i - first} * std::uint64_t{kBHCellBytes});
       const SegmentPosition::Cell& folded = reading.position.cells[i];
-      const bool isFolded =
-          look.sets == folded.sets && look.value == folded.value && !isNewDay(look, folded);
+      const bool isFolded = look.sets == folded.sets && look.value == folded.value;
       if (look.key != 0 && (!isFolded || awaitsAcknowledgement(look))) readCell(reading, i);
     }
   }
@@ -279,11 +272,11 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
   // have moved to another day since, and nobody knows how much of the value belongs to that.
   if (!reading.position.isKnown && now.acknowledged != 0) {
     if (now.closes != now.acknowledged) ++reading.progress.refused;
-    folded = {now.start, now.sets, now.value};
+    folded = {now.sets, now.value};
   }
   const bool isSet = now.sets != folded.sets;
   const std::int64_t value = isSet ? now.value : wrappingSubtract(now.value, folded.value);
-  if (isSet || value != 0 || isNewDay(now, folded)) {
+  if (isSet || value != 0) {
     const std::string* const key = file_.key(before.key, kBHKindScalar);
     const auto instant = dayAndSecond(secondsOf(before.start, reading.boot));
     if (key != nullptr && instant && (isUndated(before.start) || instant->secondsInDay == 0)) {
@@ -296,7 +289,7 @@ void SegmentReader::readCell(Reading& reading, std::uint32_t index) {
       return;
     }
   }
-  folded = {now.start, now.sets, now.value};
+  folded = {now.sets, now.value};
   if (awaitsAcknowledgement(before)) {
     reading.progress.acknowledgements.push_back({offset + kBHCellAcknowledged, before.closes});
   }
