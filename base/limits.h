@@ -77,7 +77,7 @@ inline constexpr std::size_t kSegmentFolderEntries = 1'000'000;
 inline constexpr std::size_t kSegmentsPerUser = 2'048;
 inline constexpr std::size_t kSegments = 16'384;
 
-/// Bytes of the positions of one user's segments in the store. A program with 35 scalars takes
+/// Bytes of the positions of one user's segments in the store. A program with fifty scalars takes
 /// one KiB. Segments whose positions would exceed this wait.
 inline constexpr std::size_t kPositionBytesPerUser = 1U << 20;
 
