@@ -12,11 +12,9 @@ for timer in daily fold upload; do
   printf '[Timer]\nRandomizedDelaySec=0\nAccuracySec=1s\n' \
     >"/run/systemd/system/tavrel-$timer.timer.d/exact.conf"
 done
-# The test sets the clock, so nothing may become due because of the time since the start.
-printf 'OnBootSec=\nOnCalendar=hourly\n' >>/run/systemd/system/tavrel-fold.timer.d/exact.conf
-mkdir -p /run/systemd/system/tavrel-daily-boot.timer.d
-printf '[Timer]\nOnBootSec=\nOnBootSec=1y\n' \
-  >/run/systemd/system/tavrel-daily-boot.timer.d/never.conf
+# Also prevent a run that is due because of the time since the start.
+printf 'OnBootSec=\nOnCalendar=*-*-* 00:05:00 UTC\n' \
+  >>/run/systemd/system/tavrel-daily.timer.d/exact.conf
 systemctl daemon-reload
 systemd-run --quiet --unit=keeps-slice --slice=tavrel.slice sleep infinity
 find / -xdev | sort >/root/before
@@ -28,8 +26,7 @@ apt-get install -qq -y --no-install-recommends "$packages"/tavrel_*.deb \
   "$packages"/python3-brimhold_*.deb >/root/apt.log 2>&1
 expect "packages are installed" 0 "$?"
 settle
-units="tavrel-daily-boot.timer
-tavrel-daily.timer
+units="tavrel-daily.timer
 tavrel-fold-shutdown.service
 tavrel-fold.path
 tavrel-fold.timer

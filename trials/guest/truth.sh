@@ -16,7 +16,7 @@ import sqlite3
 store = sqlite3.connect("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb")
 print(*store.execute("PRAGMA integrity_check").fetchone())')"
 expect "a run is due again without a midnight" 10min \
-  "$(systemctl show -P TimersMonotonic tavrel-daily-boot.timer | sed -n 's/.*OnBootUSec=\([^ ]*\) .*/\1/p')"
+  "$(systemctl show -P TimersMonotonic tavrel-daily.timer | sed -n 's/.*OnBootUSec=\([^ ]*\) .*/\1/p')"
 systemctl start tavrel-daily.service
 settle
 expect "that run ends the day" 24799 "$(day_done)"
