@@ -22,8 +22,7 @@ constexpr OutcomeTexts kTexts[] = {
     {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},
-    {"store-unreadable",
-     "the statistics store could not be read; once it can, force a run for that day"},
+    {"store-unreadable", "the statistics store could not be read; see the system log"},
     {"not-filed", "filing failed; see the system log"},
 };
 static_assert(std::size(kTexts) == static_cast<std::size_t>(LogOutcome::NotFiled) + 1);

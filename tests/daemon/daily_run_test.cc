@@ -143,9 +143,7 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
   fake.submission.fails = true;
   EXPECT_EQ(run(6), "writing tallied log. yesterday=6");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("not-filed"));
-  EXPECT_EQ(run(7),
-            "no log for day 7: the statistics store could not be read; once it can, force a run "
-            "for that day");
+  EXPECT_EQ(run(7), "no log for day 7: the statistics store could not be read; see the system log");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("store-unreadable"));
 }
 

@@ -180,7 +180,7 @@ TEST_F(CheckTest, JudgesTheLastLog) {
          1},
         {"store-unreadable",
          "CRITICAL last-log: the last run: no" + day +
-             ": the statistics store could not be read; once it can, force a run for that day\n",
+             ": the statistics store could not be read; see the system log\n",
          2},
         {"not-filed",
          "CRITICAL last-log: the last run: no" + day + ": filing failed; see the system log\n",
