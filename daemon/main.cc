@@ -2,7 +2,6 @@
 #include <csignal>
 #include <cstddef>
 #include <cstdio>
-#include <cstdlib>
 #include <exception>
 #include <fcntl.h>
 #include <span>
@@ -11,6 +10,7 @@
 #include <unistd.h>
 #include <utility>
 
+#include "base/activated_descriptors.h"
 #include "daemon/entry.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/process/linux_clock.h"
@@ -52,7 +52,7 @@ constexpr std::chrono::seconds kPauseOfService{30};
 /// Clients still wait for the socket that the service manager passed: it starts the next process as
 /// soon as this one ends.
 void pauseIfActivated() {
-  if (std::getenv("LISTEN_FDS") != nullptr) std::this_thread::sleep_for(kPauseOfService);
+  if (tavrel::activatedDescriptors(getpid()) > 0) std::this_thread::sleep_for(kPauseOfService);
 }
 
 /// False when the run could not begin or was cut short.

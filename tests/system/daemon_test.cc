@@ -315,6 +315,18 @@ TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
             "com.example.walk");
 }
 
+TEST(DaemonTest, PausesOnlyForItsOwnSocketWhenItCannotWork) {
+  for (const bool isOwn : {true, false}) {
+    const int daemon = forkProcess([&] {
+      ::setenv("LISTEN_FDS", "1", 1);
+      ::setenv("LISTEN_PID", std::to_string(isOwn ? ::getpid() : ::getppid()).c_str(), 1);
+      ::alarm(isOwn ? 1 : 20);  // less than the pause; remains across exec
+      executeBelow("/nonexistent", nullptr);
+    });
+    EXPECT_EQ(waitFor(daemon), isOwn ? -SIGALRM : 0);
+  }
+}
+
 TEST(DaemonTest, LosesNothingWhenManyRunAtOnce) {
   const Device device;
   std::vector<int> processes;
