@@ -58,8 +58,9 @@ void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segmen
 /* Whether the segment's file, or its folder, has been removed. Not known, and false, in a process
  * that has changed its root folder or mounts. */
 bool bhWasRemoved(const char* folder, struct SegmentName name);
-/* Whether the process could create the file that asks for a fold. */
-bool bhMayAskForFold(const char* folder);
+/* Whether the process could create the file that asks for a fold, in the folder that has its
+ * segment. */
+bool bhMayAskForFold(const char* folder, struct SegmentName name);
 /* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);

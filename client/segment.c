@@ -121,14 +121,13 @@ static const char* textOf(BHClientStatus status) {
   return "unknown status";
 }
 
-/* Threads keep pointers into the segment, so that no other can take its place. */
-static bool isRemoved(const struct Process* process) {
-  struct State* state = process->state;
+/* Without a thread while the one that begins the segment has not noted its name yet. */
+static struct SegmentName nameOfSegment(struct State* state) {
   struct SegmentName name;
   name.thread = atomic_load_explicit(&state->nameThread, memory_order_acquire);
   name.time = atomic_load_explicit(&state->nameTime, memory_order_relaxed);
   name.root = atomic_load_explicit(&state->nameRoot, memory_order_relaxed);
-  return name.thread != 0 && bhWasRemoved(process->folder, name);
+  return name;
 }
 
 static BHClientStatus currentStatus(void) {
@@ -138,9 +137,12 @@ static BHClientStatus currentStatus(void) {
   if (!bhSegment(process)) {
     return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
   }
-  if (isRemoved(process)) return BHClientStatusRemoved;
+  const struct SegmentName name = nameOfSegment(state);
+  const bool isNamed = name.thread != 0;
+  /* Threads keep pointers into the segment, so that no other can take its place. */
+  if (isNamed && bhWasRemoved(process->folder, name)) return BHClientStatusRemoved;
   if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
-  if (!bhMayAskForFold(process->folder)) return BHClientStatusCannotAsk;
+  if (isNamed && !bhMayAskForFold(process->folder, name)) return BHClientStatusCannotAsk;
   return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
 }
 

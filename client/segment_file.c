@@ -96,12 +96,6 @@ void bhPostFoldWanted(const char* folder) {
   closeFile(directory);
 }
 
-/* Other errors say nothing about the rights of the process: some sandboxes refuse the call. */
-bool bhMayAskForFold(const char* folder) {
-  return faccessat(AT_FDCWD, folder, W_OK | X_OK, AT_EACCESS) == 0 ||
-         (errno != EACCES && errno != ENOENT);
-}
-
 /* Checked first, since growing a file beyond the limit would raise SIGXFSZ. */
 static bool mayMakeFilesThatLarge(void) {
   struct rlimit limit;
@@ -217,4 +211,28 @@ bool bhWasRemoved(const char* folder, struct SegmentName name) {
   const bool isGone = fstatat(directory, file, &entry, AT_SYMLINK_NOFOLLOW) != 0 && errno == ENOENT;
   closeFile(directory);
   return isGone;
+}
+
+/* A lack of memory or descriptors says nothing about the rights of the process. */
+static bool mayLater(int error) {
+  const BHClientStatus status = statusOf(error);
+  return status != BHClientStatusNoFolder && status != BHClientStatusNotAllowed;
+}
+
+bool bhMayAskForFold(const char* folder, struct SegmentName name) {
+  const int directory = openFolder(folder);
+  if (directory < 0) return mayLater(errno);
+  char ownFile[64];
+  writeName(ownFile, name);
+  struct stat entry;
+  bool may = fstatat(directory, ownFile, &entry, AT_SYMLINK_NOFOLLOW) == 0 || mayLater(errno);
+  if (may) {
+    /* An unnamed file needs the same rights. Where the kernel lacks faccessat2(), the C library's
+     * faccessat() would judge the real user instead of the effective one. */
+    const int file = openFile(directory, ".", O_TMPFILE | O_WRONLY, 0600);
+    may = file >= 0 || mayLater(errno);
+    if (file >= 0) closeFile(file);
+  }
+  closeFile(directory);
+  return may;
 }

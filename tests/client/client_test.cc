@@ -376,10 +376,16 @@ TEST_F(Recording, AProcessThatMovesIsNotTakenForOneWithoutAFile) {
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
-        mount("none", root.c_str(), "tmpfs", 0, nullptr) != 0) {
+        mount(folder.c_str(), folder.c_str(), nullptr, MS_BIND, nullptr) != 0) {
       return;
     }
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
+    ASSERT_EQ(mount("none", folder.c_str(), nullptr, MS_REMOUNT | MS_BIND | MS_RDONLY, nullptr), 0);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusCannotAsk);
+    ASSERT_EQ(mount("none", root.c_str(), "tmpfs", 0, nullptr), 0);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusCannotAsk);
+    std::filesystem::create_directories(folder);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusCannotAsk) << "not the folder of its file";
   });
   fold();
   EXPECT_EQ(records["series"], std::vector<double>{1});
