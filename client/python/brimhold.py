@@ -22,8 +22,6 @@ After `os.fork` the child records for itself. Calls may come from any thread.
 
 from __future__ import annotations
 
-import collections.abc
-import contextlib
 import ctypes
 import enum
 import functools
@@ -157,16 +155,6 @@ class Distribution:
         return Timer(self, milliseconds=milliseconds)
 
 
-_NO_GENERATOR = "a timer measures no generator: use it in a with statement"
-_GENERATORS = (
-    collections.abc.Generator,
-    collections.abc.AsyncGenerator,
-    # What these two make has no public name.
-    type(contextlib.contextmanager(lambda: iter(()))()),
-    type(contextlib.asynccontextmanager(lambda: None)()),  # type: ignore[arg-type,return-value]
-)
-
-
 class Timer:
     """Measures how long a block or a function takes, on the monotonic clock, in seconds or
     milliseconds. A block that raises is recorded too.
@@ -178,8 +166,8 @@ class Timer:
         def work(): ...
 
     A timer measures one block at a time: make one for each block. It measures any number of calls
-    of a function, or of a coroutine until it returns, but no generator and no context manager made
-    from one.
+    of a function, or of a coroutine until it returns. It refuses generator functions. Of a function
+    that returns a generator, or another object that works later, it measures only the call.
     """
 
     __slots__ = ("_distribution", "_milliseconds", "_started")
@@ -214,7 +202,7 @@ class Timer:
         import inspect  # only here, since it takes milliseconds
 
         if inspect.isgeneratorfunction(function) or inspect.isasyncgenfunction(function):
-            raise TypeError(_NO_GENERATOR)
+            raise TypeError("a timer measures no generator: use it in a with statement")
 
         async def result_of(coroutine: typing.Awaitable[typing.Any]) -> typing.Any:
             with Timer(self._distribution, milliseconds=self._milliseconds):
@@ -232,11 +220,10 @@ class Timer:
             except BaseException:
                 self._record(started)
                 raise
-            # A decorator or an object with __call__ hides what kind of function is called.
-            if isinstance(result, collections.abc.Coroutine):
+            # A decorator or an object with __call__ hides what kind of function is called. Other
+            # objects that can be awaited stay as they are, since they may be more than that.
+            if inspect.iscoroutine(result):
                 return result_of(result)
-            if isinstance(result, _GENERATORS):
-                raise TypeError(_NO_GENERATOR)
             self._record(started)
             return result
 
