@@ -105,6 +105,24 @@ TEST_F(Statsd, CountsLinesOfKeysBeyondTheLimits) {
   EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4 + 1} + fits);
 }
 
+TEST_F(Statsd, SaysOnceWhenThereIsNoRoomForFurtherKeys) {
+  const std::string path = root / "statsd.sock";
+  auto listening = openUnixSocket(path);
+  ASSERT_TRUE(listening);
+  std::vector<std::string> datagrams(5);
+  for (int i = 0; i < kBHKeys; ++i)
+    datagrams.at(std::size_t(i) / 1000) += std::to_string(i) + ":1|c\n";
+  send(AF_UNIX, unixAddress(path), datagrams);
+  const Descriptor passed(dup(listening->descriptor()));  // survives exec
+  EXPECT_EQ(outputOf("LISTEN_FDS=1 exec sh -c 'LISTEN_PID=$$ exec " + kProgram +
+                     " --idle 1' 2>&1 3<&" + std::to_string(passed.get())),
+            "tavrel-statsd: no room for further keys: lines with new names are refused until the "
+            "program starts again: keep what varies, such as an id, out of names\n");
+  testClock().realtime = 0;
+  fold();
+  EXPECT_EQ(fault("refused"), 4);
+}
+
 TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   const std::string path = root / "statsd.sock";
   auto unixSocket = openUnixSocket(path);
