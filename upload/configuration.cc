@@ -36,9 +36,9 @@ constexpr Switch kSwitches[] = {{"AllowPlainHTTP", &Configuration::mayBePlain},
 constexpr std::string_view kUrlKey = "URL";
 constexpr std::string_view kMeteredKey = "MeteredInterfaces";
 
-// Nothing when the URL lacks that part.
 constexpr const char* kNoUrl = "URL is not an address: give https://HOST/FOLDER";
 
+// Nothing when the URL lacks that part.
 std::optional<std::string> partOf(CURLU* url, CURLUPart part) {
   char* text = nullptr;
   if (curl_url_get(url, part, &text, 0) != CURLUE_OK) return std::nullopt;

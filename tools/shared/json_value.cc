@@ -71,8 +71,6 @@ bool isSpecial(std::string_view key) {
   return key == kDataMember || key == kDateMember || key == kRealMember;
 }
 
-// Builds values directly from the parser's events, so that numbers keep every digit and a document
-// that nests too deeply is refused before anything recurses over it.
 /// "not JSON at line 2, column 4: invalid literal", from "[TAG] parse error at line 2, column 4:
 /// syntax error while parsing value - invalid literal; last read: 'no'". The line is left out when
 /// there is only one, and other messages lose only their tag.
@@ -93,11 +91,13 @@ std::string inOurWords(std::string_view words, bool isOneLine) {
   return format("not JSON at %s: %s", place, reason.substr(0, reason.find(';')));
 }
 
+/// Builds values directly from the parser's events, so that numbers keep every digit and a document
+/// that nests too deeply is refused before anything recurses over it.
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
-  plist::Value takeResult() { return std::move(result_); }
   explicit ValueBuilder(bool isOneLine) : isOneLine_(isOneLine) {}
 
+  plist::Value takeResult() { return std::move(result_); }
   const std::string& message() const { return message_; }
 
   bool null() override { return fail("a property list cannot contain null"); }

@@ -37,7 +37,8 @@ void showSelected(ToolContext& context, const Selection& selection) {
 void addSelection(Command command, Selection& selection) {
   command.addOption("PREFIX", selection.prefix, "Only keys that begin with this");
   command
-      .addOption("--day", selection.day, "Only this day: today, yesterday, a number or YYYY-MM-DD")
+      .addOption("--day", selection.day,
+                 "Only this day: today, yesterday, a day number or YYYY-MM-DD")
       .typeName("DAY");
 }
 
@@ -50,7 +51,7 @@ void addImport(Command group, ToolContext& context) {
   import.addOption("FILE", *file, "Lines to import, all or none; - is standard input (default)")
       .notEmpty();
   import.setFooter(
-      "DAY is today, yesterday, a number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar "
+      "DAY is today, yesterday, a day number or YYYY-MM-DD; SECONDS is 0 to 86399. A scalar "
       "replaces\nthe one of its day. Values are added to those of their day: importing a file "
       "twice\ndoubles them.");
   context.addJsonOption(import);
