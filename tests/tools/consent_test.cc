@@ -209,6 +209,12 @@ TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
     EXPECT_EQ(run(command).error.substr(0, both.size()), both) << command;
   EXPECT_EQ(run("log show StorageSt").error, both);
   EXPECT_EQ(run("log show StorageStatus-2").error, "");
+  const fs::path before = fs::current_path();
+  fs::current_path(device.path(""));
+  device.write("/plain", "a text\n");  // a file of the working folder needs no log folder
+  const Outcome plain = run("log show plain");
+  fs::current_path(before);
+  EXPECT_EQ(plain.error, "");
   EXPECT_EQ(
       run("log show StorageStatus-4").error,
       both + "tavrelctl: no log or file StorageStatus-4: 'tavrelctl log list' shows the logs\n");

@@ -110,8 +110,8 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
   return filed;
 }
 
-Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name) {
-  std::vector<Unseen> unseen;
+Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name,
+                                               std::vector<Unseen>& unseen) {
   auto logs = filesOfLogs(context, unseen);
   if (!logs) return logs;
   // A log in both folders, for example after a power cut, is still waiting.
@@ -120,11 +120,10 @@ Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string
   });
   if (named != logs->rend()) {
     context.linuxPlatform().submission().readMetadata(*named);
+    unseen.clear();
     return std::vector{std::move(*named)};
   }
   if (name.find('/') != std::string_view::npos) return std::vector<FiledLog>();
-  for (const Unseen& folder : unseen)
-    context.note(folder.message);
   std::erase_if(*logs, [name](const FiledLog& log) { return !log.name.starts_with(name); });
   readFacts(context, *logs);
   return logs;

@@ -43,9 +43,11 @@ struct FiledLogs {
 Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most);
 
 /// The logs that `name` identifies: that of this path or of this file name, with or without the
-/// extension; when there is none, those whose names begin with `name`, oldest first. For names
-/// without a slash, notes then say which folders cannot be seen.
-Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name);
+/// extension; when there is none, those whose names begin with `name`, oldest first. `unseen`
+/// receives the reasons why withheld or refused logs cannot be seen, unless the name is that of a
+/// log.
+Expected<std::vector<FiledLog>> filedLogsNamed(ToolContext& context, std::string_view name,
+                                               std::vector<Unseen>& unseen);
 
 /// The newest log whose name begins with `namePrefix` and that `accepts` takes; nothing when there
 /// is none. The choice goes by file names, so few metadata files are read. `unseen` receives the

@@ -113,9 +113,12 @@ Expected<LogEnvelope> logNamed(ToolContext& context, const std::string& name) {
   const LogEnvelope file{"file", name, {}};
   if (name == "-" || name.empty()) return file;
   const bool isFile = name.find('/') != std::string::npos || FileSystem::status(name);
-  const auto logs = filedLogsNamed(context, name);
+  std::vector<Unseen> unseen;
+  const auto logs = filedLogsNamed(context, name, unseen);
   if (!logs && !isFile) return logs.error();
-  if (!logs) return file;
+  if (!logs || (logs->empty() && isFile)) return file;
+  for (const Unseen& folder : unseen)
+    context.note(folder.message);
   std::set<std::string_view> names;
   for (const FiledLog& log : *logs)
     names.insert(log.name);
@@ -126,10 +129,7 @@ Expected<LogEnvelope> logNamed(ToolContext& context, const std::string& name) {
                name, names.size())};
   }
   if (!logs->empty()) return envelopeOf(logs->back());
-  if (!isFile) {
-    return Error{format("no log or file %s: 'tavrelctl log list' shows the logs", name)};
-  }
-  return file;
+  return Error{format("no log or file %s: 'tavrelctl log list' shows the logs", name)};
 }
 
 }  // namespace tavrel
