@@ -145,7 +145,7 @@ FileSubmission& LinuxPlatform::submission() {
 SegmentFold& LinuxPlatform::fold() {
   return services_->fold;
 }
-const std::optional<std::string>& LinuxPlatform::missingValues() const {
+const std::vector<std::string>& LinuxPlatform::missingValues() const {
   return services_->unfoldedStore.missing();
 }
 RecordedRegistry& LinuxPlatform::registry() {

@@ -12,6 +12,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "platform/linux/files/device_root.h"
 #include "platform/platform.h"
@@ -55,7 +56,7 @@ class LinuxPlatform {
   RecordedRegistry& registry();
   SqliteStore& store();
   /// Which waiting values a read-only platform could not read, for people.
-  const std::optional<std::string>& missingValues() const;
+  const std::vector<std::string>& missingValues() const;
 
  private:
   struct Services;

@@ -279,25 +279,26 @@ TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
   waitpid(child, nullptr, WUNTRACED);
   foldNow();
   LinuxPlatform device(DeviceRoot(root), {.log = &log});
-  const auto warning = [&] {
+  const auto warnings = [&] {
     return RecordedHistory::open(DeviceRoot(root), device.store(), Recorders(), {.key = ""})
-        ->warning()
-        .value_or("");
+        ->warnings();
   };
-  EXPECT_EQ(warning(), "");
+  using Lines = std::vector<std::string>;
+  EXPECT_EQ(warnings(), Lines());
   testClock().whenRead = [] {  // touch the mark as a fold does
     static timespec times[2];
     ++times[1].tv_sec;
     utimensat(AT_FDCWD, (getenv("TAVREL_ROOT") + std::string("/run/tavrel/fold.lock")).c_str(),
               times, 0);
   };
-  EXPECT_EQ(warning(),
-            "folds took values during each attempt to read them, and some are not shown: run it "
-            "again");
+  EXPECT_EQ(warnings(),
+            Lines{"folds took values during each attempt to read them, and some are not "
+                  "shown: run it again"});
   testClock().whenRead = nullptr;
   openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
       .execute("UPDATE segments SET position = x'63000000'");  // from another version
-  EXPECT_EQ(warning(), "1 segments with values that wait are not shown: run 'tavrelctl stat fold'");
+  EXPECT_EQ(warnings(),
+            Lines{"1 segments with values that wait are not shown: run 'tavrelctl stat fold'"});
   kill(child, SIGKILL);
   waitFor(child);
 }

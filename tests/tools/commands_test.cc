@@ -227,7 +227,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   EXPECT_EQ(first["day"], -2147483648);
   EXPECT_EQ(first["start"], "-5877641-06-23T00:00:00Z");
 
-  const std::string none = "no log would be submitted for day ";
+  const std::string none = "no log would be filed for day ";
   device.check("log preview --day 19999",
                fails(none + "19999 (2024-10-03): no value found for any whitelisted key"));
   const Outcome verbose = device.run("log preview --day 20000 -v");

@@ -1,9 +1,11 @@
 // What programs record, as the tool shows and folds it.
 #include <optional>
 #include <sys/resource.h>
+#include <unistd.h>
 
 #include "brimhold/client.h"
 #include "device.h"
+#include "tools/shared/day_argument.h"
 
 namespace tavrel {
 namespace {
@@ -74,6 +76,61 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   EXPECT_NE(failed.error.find("; what programs recorded waits for the next fold\n"),
             std::string::npos)
       << failed;
+}
+
+// A closed store is not an empty one, and no line hides or repeats another.
+TEST(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
+  const TemporaryDevice device;
+  std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
+  std::filesystem::create_directories(device.path("/run/tavrel/stat"));
+  device.run("stat import", "scalar\ttoday\tapp.n\t1\n");
+  EXPECT_EQ(inChild([&] {
+              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
+              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
+              return 0;
+            }),
+            0);
+  device.write(kWhitelistFile, xmlOf(R"({"G": {"ScalarKeys": {"app.n": {}}}})"));
+  device.write("/etc/tavrel/recorders.plist", xmlOf(R"({"nosuchuser": ["app.x"]})"));
+  device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
+  const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");
+  std::filesystem::permissions(store, std::filesystem::perms{0600});
+  const auto run = [&](const std::string& command) {
+    EXPECT_EQ(seteuid(65534), 0);
+    Outcome outcome = device.run(command);
+    EXPECT_EQ(seteuid(0), 0);
+    EXPECT_EQ(outcome.status, 1) << outcome;
+    return outcome;
+  };
+  const auto expectOnce = [](const Outcome& outcome, const std::string& line) {
+    const std::size_t first = outcome.error.find(line);
+    EXPECT_NE(first, std::string::npos) << line << "\n" << outcome;
+    EXPECT_EQ(outcome.error.find(line, first + 1), std::string::npos) << line << "\n" << outcome;
+  };
+  const std::string others =
+      "tavrelctl: what waits in segments of other users (1) is not shown: run it as root\n";
+  const std::string unknown = "the entry \"nosuchuser\" names no user";
+  const std::string closed = "statistics store " + store + ": ";
+  for (const char* command : {"log preview --day today", "log preview --day today -v"}) {
+    const Outcome previewed = run(command);
+    expectOnce(previewed, others);
+    expectOnce(previewed, unknown);
+    expectOnce(previewed, "no log would be filed for day " + dayText(today()) + ": " + closed);
+  }
+  const Outcome rehearsed = run("rehearse --today");
+  expectOnce(rehearsed, others);
+  expectOnce(rehearsed, "the run would log 2 errors; the first: ");
+  EXPECT_NE(rehearsed.out.find(": the statistics store could not be read; once it can, "),
+            std::string::npos)
+      << rehearsed;
+  const Outcome page = run("page -o - --day today");
+  expectOnce(page, others);
+  expectOnce(page, unknown);
+
+  std::filesystem::permissions(store, std::filesystem::perms{0644});
+  const std::string part = run("log preview --day today -v").error;
+  EXPECT_TRUE(part.ends_with(others)) << part;
 }
 
 // However few files may be open, everything is shown, or a line says what could not be read.

@@ -114,7 +114,12 @@ void checkCounters(CheckScene& scene, const Recorders& recorders,
     lost.add(key, value);
   })
                               : Status(history.error());
-  std::string gap = read ? history->warning().value_or("") : read.error().message;
+  std::string gap;
+  if (!read) {
+    gap = read.error().message;
+  } else if (const auto warnings = history->warnings(); !warnings.empty()) {
+    gap = warnings.front();
+  }
   if (gap.empty() && folder && *folder) {
     const auto listing = (*folder)->list();
     if (listing && hasClosedSegments(*listing)) gap = kClosedSegments;

@@ -41,7 +41,7 @@ Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
                                 .hasValues = false};
   auto history = RecordedHistory::open(context.root(), store, recorders, everything);
   if (!history) return history.error();
-  if (history->warning()) return Error{*history->warning()};
+  if (const auto warnings = history->warnings(); !warnings.empty()) return Error{warnings.front()};
   const auto days = history->daysHeld();
   if (!days) return days.error();
   std::optional<std::int32_t> latest;

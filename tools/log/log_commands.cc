@@ -149,6 +149,8 @@ void preview(ToolContext& context, const Arguments& arguments) {
   }
   const LogPreview preview = previewLog(context, day, onLine);
   // An incomplete document must not pass for a complete one.
+  for (const std::string& line : preview.missingValues)
+    context.fail(line);
   if (!preview.errors.empty()) context.setExitStatus(kExitFailure);
   if (!arguments.verbose) {
     for (const std::string& error : preview.errors)
@@ -156,7 +158,7 @@ void preview(ToolContext& context, const Arguments& arguments) {
   }
   if (!preview.log) {
     return context.fail(
-        format("no log would be submitted for day %s: %s", dayText(day), preview.reason));
+        format("no log would be filed for day %s: %s", dayText(day), preview.reason));
   }
   const SubmissionPermission permission = submissionPermission(context.preferences());
   if (permission.isGiven && !permission.covers(day)) {

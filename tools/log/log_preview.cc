@@ -21,7 +21,9 @@ void explainAbsence(ToolContext& context, std::string_view lastError, LogOutcome
     });
     return;
   }
-  preview.reason = lastError.empty() ? whyNoLog(outcome) : lastError;
+  // What was logged while all could be read has not kept anything from the log.
+  const bool isExplained = outcome != LogOutcome::NothingToReport && !lastError.empty();
+  preview.reason = isExplained ? lastError : whyNoLog(outcome);
   std::erase(preview.errors, preview.reason);
 }
 
@@ -48,7 +50,7 @@ LogPreview previewLog(
   } else {
     explainAbsence(context, overlay.lastError(), outcome, preview);
   }
-  if (overlay.missingValues()) preview.errors.push_back(*overlay.missingValues());
+  preview.missingValues = overlay.missingValues();
   return preview;
 }
 

@@ -19,6 +19,7 @@ struct LogPreview {
   std::string reason;               // why there is none
   bool lacksWhitelist = false;      // whether that is the reason
   std::vector<std::string> errors;  // logged while it was made; the log may then be incomplete
+  std::vector<std::string> missingValues;  // which waiting ones the log lacks, for people
   std::string osVersion;
 };
 

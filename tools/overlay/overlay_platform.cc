@@ -104,7 +104,7 @@ const std::vector<CapturedLog>& OverlayPlatform::logs() const {
   return services_->submission.logs;
 }
 
-const std::optional<std::string>& OverlayPlatform::missingValues() const {
+const std::vector<std::string>& OverlayPlatform::missingValues() const {
   return services_->below.missingValues();
 }
 

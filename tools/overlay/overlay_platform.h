@@ -10,7 +10,6 @@
 #pragma once
 
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -39,7 +38,7 @@ class OverlayPlatform {
 
   const std::vector<CapturedLog>& logs() const;
   /// Which values that wait to be folded could not be read, for people.
-  const std::optional<std::string>& missingValues() const;
+  const std::vector<std::string>& missingValues() const;
   /// The last entry at error level; empty when there was none.
   std::string_view lastError() const;
 

@@ -31,6 +31,7 @@ struct Arguments {
 PageLog pageLogOf(ToolContext& context, const LogPreview& preview, std::int32_t day) {
   PageLog log;
   log.errors = preview.errors;
+  log.errors.insert(log.errors.end(), preview.missingValues.begin(), preview.missingValues.end());
   log.isCovered = submissionPermission(context.preferences()).covers(day);
   if (!preview.log) {
     log.reason = preview.reason;
@@ -58,10 +59,10 @@ void makePage(ToolContext& context, const Arguments& arguments) {
       readRecordedDays(context, day, static_cast<std::int32_t>(arguments.days));
   if (!recorded.fault.empty()) context.fail(recorded.fault);
   const LogPreview preview = previewLog(context, recorded.day);
-  for (const std::string& error : preview.errors)
-    context.fail(error);
-  if (preview.lacksWhitelist) context.note(preview.reason);
   const PageLog log = pageLogOf(context, preview, recorded.day);
+  for (const std::string& error : log.errors)
+    context.failOnce(error);
+  if (preview.lacksWhitelist) context.note(preview.reason);
 
   page::Document document(format("Device on %s", dayDateText(recorded.day)));
   PageScene scene{context, document, recorded, log, preview.osVersion};

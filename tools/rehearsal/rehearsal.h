@@ -27,8 +27,8 @@ struct RehearsedStep {
 struct Rehearsal {
   std::int32_t day;
   std::vector<RehearsedStep> steps;
-  std::optional<LogOutcome> logOutcome;      // nothing when the gate stopped the run
-  std::optional<std::string> missingValues;  // which waiting ones could not be read, for people
+  std::optional<LogOutcome> logOutcome;    // nothing when the gate stopped the run
+  std::vector<std::string> missingValues;  // which waiting ones could not be read, for people
 };
 
 /// Plays the daemon's own run over the device.

@@ -283,7 +283,8 @@ void addRehearseCommand(Command app, ToolContext& context) {
       print(context, rehearsal, run, arguments->verbose);
     }
     failOnErrors(context, rehearsal);
-    if (rehearsal.missingValues) context.fail(*rehearsal.missingValues);
+    for (const std::string& line : rehearsal.missingValues)
+      context.fail(line);
   });
 }
 

@@ -15,7 +15,7 @@ class ToolContext::NotingLog final : public SystemLog {
   explicit NotingLog(ToolContext& context) : context_(context) {}
   void write(LogLevel level, std::string_view message) override {
     if (level < LogLevel::Default) return;
-    context_.note(message);
+    if (context_.isNew(message)) context_.note(message);
     context_.hasComplaints_ = context_.hasComplaints_ || level == LogLevel::Error;
   }
 
@@ -64,6 +64,11 @@ ToolContext::Services& ToolContext::services() {
 
 FilePreferences& ToolContext::preferences() {
   return services().device.preferences();
+}
+
+void ToolContext::failOnce(std::string_view message) {
+  if (isNew(message)) return fail(message);
+  setExitStatus(kExitFailure);
 }
 
 SqliteStore& ToolContext::storeForReading() {

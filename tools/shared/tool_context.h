@@ -17,7 +17,9 @@
 
 #include <memory>
 #include <optional>
+#include <set>
 #include <string>
+#include <string_view>
 
 #include "tools/shared/tool_output.h"
 
@@ -38,12 +40,15 @@ class ToolContext : public ToolOutput {
   /// when the folder does not exist; `runTavrelctl` turns that into a failure.
   const DeviceRoot& root();
   /// Built over `root()` on the first call; include platform/linux/linux_platform.h to use it. Log
-  /// lines of its services appear as notes.
+  /// lines of its services appear as notes, equal ones once.
   LinuxPlatform& linuxPlatform();
   Platform& platform();
   FilePreferences& preferences();
   /// The device's store, opened read-only: a damaged one stays in place for the next run.
   SqliteStore& storeForReading();
+  /// `fail`, but shows a line only once, also when it was a note of a service. For what each
+  /// reading of the device finds again.
+  void failOnce(std::string_view message);
   /// Whether a service of the device has logged an error.
   bool hasComplaints() const { return hasComplaints_; }
   /// Set by `--root`; takes effect on the first use of the device.
@@ -54,10 +59,12 @@ class ToolContext : public ToolOutput {
   struct Services;
 
   Services& services();
+  bool isNew(std::string_view message) { return shown_.emplace(message).second; }
 
   std::optional<std::string> rootFolder_;
   std::unique_ptr<DeviceRoot> root_;
   bool hasComplaints_ = false;
+  std::set<std::string> shown_;
   std::unique_ptr<Services> services_;  // uses all of the above
 };
 

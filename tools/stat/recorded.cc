@@ -13,7 +13,9 @@ Expected<RecordedHistory> openRecorded(ToolContext& context, RowSelection select
                       context.platform().propertyLists, context.platform().log);
   auto history = RecordedHistory::open(context.root(), context.storeForReading(), recorders,
                                        std::move(selection));
-  if (history && history->warning()) context.fail(*history->warning());
+  if (!history) return history;
+  for (const std::string& line : history->warnings())
+    context.failOnce(line);
   return history;
 }
 

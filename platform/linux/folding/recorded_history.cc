@@ -102,7 +102,8 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
   const auto folder = SegmentFolder::open(root);
   if (!folder) {
     if (!SegmentFolder::isOutOfReach(root)) return folder.error();
-    history.warning_ = folder.error().message + "; what waits to be folded is not shown";
+    history.missingValues_.push_back(folder.error().message +
+                                     "; what waits to be folded is not shown");
   }
   bool isOvertaken = true;
   for (int attempt = 0; attempt < kAttempts && isOvertaken; ++attempt) {
@@ -110,9 +111,11 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
     auto stored = store.openHistory();
     if (stored) {
       history.stored_ = *std::move(stored);
+      history.storeFault_.reset();
       if (Status begun = history.stored_->beginSnapshot(); !begun) return begun.error();
     } else if (folder && *folder && mayNotRead(store.path())) {
-      history.warning_ = stored.error().message + "; only what waits to be folded is shown";
+      history.stored_.reset();
+      history.storeFault_ = stored.error();
     } else {
       return stored.error();
     }
@@ -124,14 +127,24 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
     isOvertaken = !isSame(FoldNotes::lastMark(root), mark);
   }
   if (const std::uint64_t leftOut = history.waiting_->leftOut(); leftOut > 0) {
-    history.warning_ = std::to_string(leftOut) +
-                       " segments with values that wait are not shown: run 'tavrelctl stat fold'";
+    history.missingValues_.push_back(
+        std::to_string(leftOut) +
+        " segments with values that wait are not shown: run 'tavrelctl stat fold'");
   }
   if (isOvertaken) {
-    history.warning_ =
-        "folds took values during each attempt to read them, and some are not shown: run it again";
+    history.missingValues_.emplace_back(
+        "folds took values during each attempt to read them, and some are not shown: run it again");
   }
   return history;
+}
+
+std::vector<std::string> RecordedHistory::warnings() const {
+  std::vector<std::string> lines;
+  if (storeFault_) {
+    lines.push_back(storeFault_->message + "; only what waits to be folded is shown");
+  }
+  lines.insert(lines.end(), missingValues_.begin(), missingValues_.end());
+  return lines;
 }
 
 Status RecordedHistory::walkStoredScalars(const BHHistory::ScalarRowHandler& rowHandler) {

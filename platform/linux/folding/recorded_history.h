@@ -7,6 +7,7 @@
 #include <memory>
 #include <optional>
 #include <string>
+#include <vector>
 
 #include "base/expected.h"
 #include "platform/linux/files/device_root.h"
@@ -20,7 +21,7 @@ namespace tavrel {
 class RecordedHistory {
  public:
   /// Later changes of the store and of the segments are not seen. When this user may not read the
-  /// store, only the waiting values are read, and `warning` says so.
+  /// store, only the waiting values are read, and `storeFault` says why.
   static Expected<RecordedHistory> open(const DeviceRoot& root, SqliteStore& store,
                                         const Recorders& recorders, RowSelection selection);
 
@@ -31,8 +32,12 @@ class RecordedHistory {
   /// The first and the last day with a row, selected or not; nothing when there is none.
   Expected<std::optional<SqliteHistory::DaySpan>> daysHeld();
 
-  /// Says, for people, what is missing.
-  const std::optional<std::string>& warning() const { return warning_; }
+  /// Why the store is not read; nothing when it is.
+  const std::optional<Error>& storeFault() const { return storeFault_; }
+  /// Which waiting values are missing, for people, in a line each.
+  const std::vector<std::string>& missingValues() const { return missingValues_; }
+  /// All that is missing, for people, in a line each.
+  std::vector<std::string> warnings() const;
 
  private:
   RecordedHistory() = default;
@@ -42,7 +47,8 @@ class RecordedHistory {
   RowSelection selection_;
   std::unique_ptr<SqliteHistory> stored_;  // null when unreadable
   std::optional<WaitingValues> waiting_;   // nothing without a segment folder
-  std::optional<std::string> warning_;
+  std::optional<Error> storeFault_;
+  std::vector<std::string> missingValues_;
 };
 
 }  // namespace tavrel

@@ -2,6 +2,8 @@
 
 #include <algorithm>
 #include <limits>
+#include <optional>
+#include <string>
 #include <unistd.h>
 #include <utility>
 
@@ -12,52 +14,59 @@ namespace tavrel {
 
 class UnfoldedStore::History final : public BHHistory {
  public:
-  explicit History(UnfoldedStore& store) : store_(store) {}
+  History(UnfoldedStore& store, Recorders recorders)
+      : store_(store), recorders_(std::move(recorders)) {}
 
   bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override {
-    auto rows = open(prefix, minDaysSince1970, maxDaysSince1970, false);
-    if (!rows) return !hasFailed_;
-    if (Status walked = rows->walkScalars(rowHandler); !walked) fail(walked.error());
-    return !hasFailed_;
+    if (select(prefix, minDaysSince1970, maxDaysSince1970)) {
+      if (Status walked = rows_->walkScalars(rowHandler); !walked) fail(walked.error());
+    }
+    return isComplete();
   }
 
   bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                                  std::int64_t maxDaysSince1970,
                                  const DistributionRowHandler& rowHandler) override {
-    auto rows = open(prefix, minDaysSince1970, maxDaysSince1970, true);
-    if (!rows) return !hasFailed_;
-    const Status walked =
-        rows->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
-                                    BHHistoryDistributionEnumerator& values,
-                                    bool& stop) { rowHandler(key, day, values, stop); });
-    if (!walked) fail(walked.error());
-    return !hasFailed_;
+    if (select(prefix, minDaysSince1970, maxDaysSince1970)) {
+      const Status walked =
+          rows_->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
+                                       BHHistoryDistributionEnumerator& values,
+                                       bool& stop) { rowHandler(key, day, values, stop); });
+      if (!walked) fail(walked.error());
+    }
+    return isComplete();
   }
 
  private:
-  // Days after `before`, up to `last`.
-  std::optional<RecordedHistory> open(std::string_view prefix, std::int64_t before,
-                                      std::int64_t last, bool hasValues) {
+  // Opens the rows of days after `before`, up to `last`. Successive queries of the same rows share
+  // them, so that no fold comes between these. False when there is nothing to walk.
+  bool select(std::string_view prefix, std::int64_t before, std::int64_t last) {
     using Day = std::numeric_limits<std::int32_t>;
-    if (hasFailed_ || before >= last || before >= Day::max() || last < Day::min()) return {};
+    if (hasFailed_ || before >= last || before >= Day::max() || last < Day::min()) return false;
     const auto firstDay = std::max(before, std::int64_t{Day::min()} - 1) + 1;
     const auto lastDay = std::min(last, std::int64_t{Day::max()});
-    const Recorders recorders =
-        Recorders::read(store_.root_, store_.files_, store_.propertyLists_, store_.log_);
-    auto history = RecordedHistory::open(store_.root_, store_.store_, recorders,
-                                         {.key = std::string(prefix),
-                                          .firstDay = static_cast<std::int32_t>(firstDay),
-                                          .lastDay = static_cast<std::int32_t>(lastDay),
-                                          .hasValues = hasValues});
-    if (!history) {
-      fail(history.error());
-      return {};
+    RowSelection selection{.key = std::string(prefix),
+                           .firstDay = static_cast<std::int32_t>(firstDay),
+                           .lastDay = static_cast<std::int32_t>(lastDay)};
+    if (rows_ && selection == selection_) return true;
+    rows_.reset();
+    selection_ = std::move(selection);
+    auto rows = RecordedHistory::open(store_.root_, store_.store_, recorders_, selection_);
+    if (!rows) {
+      fail(rows.error());
+      return false;
     }
-    if (history->warning()) store_.missing_ = history->warning();
-    return *std::move(history);
+    rows_ = *std::move(rows);
+    lacksStore_ = rows_->storeFault().has_value();
+    if (lacksStore_) store_.log_.write(LogLevel::Error, rows_->storeFault()->message);
+    store_.missing_.insert(store_.missing_.end(), rows_->missingValues().begin(),
+                           rows_->missingValues().end());
+    return true;
   }
+
+  bool isComplete() const { return !hasFailed_ && !lacksStore_; }
 
   void fail(const Error& error) {
     hasFailed_ = true;
@@ -65,10 +74,15 @@ class UnfoldedStore::History final : public BHHistory {
   }
 
   UnfoldedStore& store_;
+  const Recorders recorders_;
+  RowSelection selection_;
+  std::optional<RecordedHistory> rows_;
   bool hasFailed_ = false;
+  bool lacksStore_ = false;
 };
 
 std::unique_ptr<BHHistory> UnfoldedStore::initWithDefaultPath() {
+  missing_.clear();
   const auto folder = SegmentFolder::open(root_);
   if (folder && !*folder) return store_.initWithDefaultPath();
   if (folder) {
@@ -77,7 +91,7 @@ std::unique_ptr<BHHistory> UnfoldedStore::initWithDefaultPath() {
     if (listing) noteSegmentsOfOthers(listing->segments);
   }
   // A folder that cannot be read fails there again, with a message.
-  return std::make_unique<History>(*this);
+  return std::make_unique<History>(*this, Recorders::read(root_, files_, propertyLists_, log_));
 }
 
 // A segment can be read by its owner and by root, who folds it.
@@ -87,8 +101,8 @@ void UnfoldedStore::noteSegmentsOfOthers(const std::vector<SegmentEntry>& segmen
   const auto others =
       std::ranges::count_if(segments, [&](const auto& entry) { return entry.owner != user; });
   if (others == 0) return;
-  missing_ = "what waits in segments of other users (" + std::to_string(others) +
-             ") is not shown: run it as root";
+  missing_.push_back("what waits in segments of other users (" + std::to_string(others) +
+                     ") is not shown: run it as root");
 }
 
 }  // namespace tavrel

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <memory>
-#include <optional>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -26,8 +25,8 @@ class UnfoldedStore final : public StatisticsStore {
                 PropertyListCoding& propertyLists, SystemLog& log)
       : root_(root), store_(store), files_(files), propertyLists_(propertyLists), log_(log) {}
 
-  /// Which waiting values a history lacked, for people.
-  const std::optional<std::string>& missing() const { return missing_; }
+  /// Which waiting values the last history lacked, for people, in a line each.
+  const std::vector<std::string>& missing() const { return missing_; }
 
   std::int32_t BHDaysSince1970() override { return store_.BHDaysSince1970(); }
   plist::Date dateForDaysSince1970(std::int32_t day) override {
@@ -49,7 +48,7 @@ class UnfoldedStore final : public StatisticsStore {
   FileSystem& files_;
   PropertyListCoding& propertyLists_;
   SystemLog& log_;
-  std::optional<std::string> missing_;
+  std::vector<std::string> missing_;
 };
 
 }  // namespace tavrel

@@ -27,6 +27,8 @@ struct RowSelection {
   std::int32_t lastDay = 0;  // included
   bool hasValues = true;     // whether measurements or only their count are wanted
 
+  bool operator==(const RowSelection&) const = default;
+
   bool contains(std::int32_t day, std::string_view name) const {
     return day >= firstDay && day <= lastDay && (isPrefix ? name.starts_with(key) : name == key);
   }
