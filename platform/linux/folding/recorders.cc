@@ -66,10 +66,10 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
 
 void Recorders::add(std::string_view user, const plist::Value& prefixes, const std::string& path,
                     SystemLog& log) {
-  const auto complain = [&](std::string_view what) {
+  const auto complain = [&](std::string_view what, LogLevel level = LogLevel::Error) {
     std::string shown;
     appendQuoted(shown, user.substr(0, 60));
-    log.log(LogLevel::Error, "%s: the entry %s %s", path, shown, what);
+    log.log(level, "%s: the entry %s %s", path, shown, what);
   };
   const plist::Array array = prefixes.array();
   if (!array) return complain("is ignored: give an array of prefixes");
@@ -83,7 +83,8 @@ void Recorders::add(std::string_view user, const plist::Value& prefixes, const s
   if (number) {
     listed_.insert(*number);
   } else {
-    complain("names no user of this machine: until it does, only root may record its keys");
+    complain("names no user of this machine: until it does, only root may record its keys",
+             LogLevel::Default);
   }
   for (const plist::Value& prefix : array) {
     auto& users = users_[std::string(*prefix.string())];
