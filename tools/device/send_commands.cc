@@ -108,10 +108,11 @@ std::string notificationFault(const std::string& name) {
 
 Expected<plist::Array> appDataOf(const plist::Value& applications) {
   const plist::Array elements = applications.array();
-  if (!elements)
+  if (!elements) {
     return Error{
         "not an array of applications: give dictionaries with \"bundle_id\", \"version\" and "
         "\"uuid\""};
+  }
   plist::Array result = plist::Array::create(elements.size());
   for (std::size_t i = 0; i < elements.size(); ++i) {
     const plist::Dictionary application = elements.at(i).dictionary();

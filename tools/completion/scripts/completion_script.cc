@@ -22,9 +22,10 @@ std::string_view CompletedProgram::valueKind(const CommandModel& command,
                                                                              {"FILE2", "files"},
                                                                              {"PATH", "files"},
                                                                              {"DIR", "folders"}};
-  for (const Exception& exception : exceptions)
+  for (const Exception& exception : exceptions) {
     if (command.path.starts_with(exception.path) && option.value == exception.value)
       return exception.list;
+  }
   for (const auto& [value, kind] : kPaths)
     if (option.value == value) return kind;
   for (const auto& [value, list] : lists)
