@@ -53,9 +53,8 @@ std::int64_t daysFromCivil(const CivilDate& date) {
 }
 
 CivilTime civilFromSeconds(std::int64_t seconds) {
-  const std::int64_t days = floorDivide(seconds, kSecondsPerDay);
   const unsigned second = secondOfDay(seconds);
-  return {civilFromDays(days), second / 3600, second / 60 % 60, second % 60};
+  return {civilFromDays(dayOfSecond(seconds)), second / 3600, second / 60 % 60, second % 60};
 }
 
 std::int64_t secondsFromCivil(const CivilTime& time) {
@@ -63,6 +62,10 @@ std::int64_t secondsFromCivil(const CivilTime& time) {
   const auto days = static_cast<std::uint64_t>(daysFromCivil(time.date));
   return static_cast<std::int64_t>(days * kSecondsPerDay + time.hour * 3600ULL +
                                    time.minute * 60ULL + time.second);
+}
+
+std::int64_t dayOfSecond(std::int64_t seconds) {
+  return floorDivide(seconds, kSecondsPerDay);
 }
 
 unsigned secondOfDay(std::int64_t seconds) {

@@ -38,7 +38,8 @@ std::int64_t daysFromCivil(const CivilDate& date);
 CivilTime civilFromSeconds(std::int64_t seconds);
 std::int64_t secondsFromCivil(const CivilTime& time);
 
-/// Seconds since midnight UTC, for any 64-bit instant.
+/// The UTC day of an instant, and the seconds since its midnight, for any 64-bit instant.
+std::int64_t dayOfSecond(std::int64_t seconds);
 unsigned secondOfDay(std::int64_t seconds);
 
 /// True for a date that exists in the calendar.

@@ -263,9 +263,8 @@ class Engine {
   }
 
   Error wrongDirective(std::string_view directive, std::size_t offset) const {
-    std::string quoted;
-    appendQuoted(quoted, directive.substr(0, kQuotedDirective));
-    return Error{format("%s at byte %zu of the format: %s", quoted, offset, reason_)};
+    return Error{format("%s at byte %zu of the format: %s",
+                        quotedText(directive.substr(0, kQuotedDirective)), offset, reason_)};
   }
 
   bool print(Directive& directive) {

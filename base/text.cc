@@ -153,6 +153,12 @@ void appendQuoted(std::string& out, std::string_view text) {
   out += '"';
 }
 
+std::string quotedText(std::string_view text) {
+  std::string out;
+  appendQuoted(out, text);
+  return out;
+}
+
 void appendText(std::string& out, const plist::Value& value) {
   switch (value.kind()) {
     case Kind::Null:

@@ -33,6 +33,7 @@ void appendHex(std::string& out, ByteSpan bytes);
 
 /// Appends `text` in quotation marks, escaped as in JSON; malformed UTF-8 is repaired.
 void appendQuoted(std::string& out, std::string_view text);
+std::string quotedText(std::string_view text);
 
 void appendText(std::string& out, const plist::Value& value);
 std::string textOf(const plist::Value& value);

@@ -283,7 +283,7 @@ plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
 // Like the submission service, judges a log without statistics by the day on which it was made.
 std::int64_t Uploader::dayToCover(const WaitingLog& log, std::string_view content) {
   const std::optional<std::int64_t> day = dayOfLog(content, services_.propertyLists);
-  return day.value_or(daysFromCivil(civilFromSeconds(log.filed).date));
+  return day.value_or(dayOfSecond(log.filed));
 }
 
 Uploader::Step Uploader::askPermission(std::int64_t day) {

@@ -42,10 +42,6 @@ std::string pValueText(double value) {
   return shortNumber(rounded(value, digits));
 }
 
-const char* kindName(const Comparison& one) {
-  return one.key.kind == KeyKind::kScalar ? "scalar" : "distribution";
-}
-
 std::string leftOutText(const CompareAnswer& answer) {
   std::string text;
   const auto add = [&](std::size_t count, const std::string& why) {
@@ -84,7 +80,7 @@ void printText(FleetContext& context, const CompareAnswer& answer, bool all) {
     if (!one.isSignificant() && !all) continue;
     table.add(
         {{one.key.name, one.isSignificant() ? Emphasis::Strong : Emphasis::None},
-         kindName(one),
+         kindText(one.key.kind),
          shortNumber(one.before.mean),
          shortNumber(one.after.mean),
          signedText(one.difference),
@@ -120,7 +116,7 @@ Json compareJson(const CompareAnswer& answer) {
   Json list = Json::array();
   for (const Comparison& one : answer.comparisons) {
     list.push_back({{"key", one.key.name},
-                    {"kind", kindName(one)},
+                    {"kind", kindText(one.key.kind)},
                     {"unit", catalogue::unitOf(one.key.name)},
                     {"changed", one.isSignificant()},
                     {"before", sideJson(one.before)},
@@ -172,7 +168,7 @@ void printCsv(std::ostream& out, const CompareAnswer& answer) {
     value ? csv.real(*value) : csv.nothing();
   };
   for (const Comparison& one : answer.comparisons) {
-    csv.text(one.key.name).title(kindName(one)).title(catalogue::unitOf(one.key.name));
+    csv.text(one.key.name).title(kindText(one.key.kind)).title(catalogue::unitOf(one.key.name));
     csv.title(one.isSignificant() ? "true" : "false");
     csv.integer(one.before.devices).integer(one.after.devices);
     csv.integer(one.before.logs).integer(one.after.logs);

@@ -4,6 +4,7 @@
 #include <cmath>
 #include <nlohmann/json.hpp>
 
+#include "base/ascii.h"
 #include "base/civil_time.h"
 #include "base/parse_number.h"
 #include "fleet/questions/day_range.h"
@@ -76,10 +77,6 @@ std::optional<DayRange> Question::readDays(std::string_view text) const {
 
 namespace {
 
-bool isDigit(char c) {
-  return c >= '0' && c <= '9';
-}
-
 // "4.1" is not a part of "4.10" or "14.1".
 bool hasPart(std::string_view version, std::string_view part) {
   if (part.empty()) return false;
@@ -148,6 +145,18 @@ std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAt
 std::string noMeanText() {
   return "NO MEAN counts logs that means and deviations leave out: some of their values are not "
          "finite, or too far apart.";
+}
+
+const char* kindText(KeyKind kind) {
+  switch (kind) {
+    case KeyKind::kScalar:
+      return "scalar";
+    case KeyKind::kDistribution:
+      return "distribution";
+    case KeyKind::kHistogram:
+      break;
+  }
+  return "histogram";
 }
 
 const char* kindText(const PartName& name) {

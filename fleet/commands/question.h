@@ -78,6 +78,8 @@ std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAt
 /// The text for a column that counts logs without a mean.
 std::string noMeanText();
 
+/// The kind of a statistic in answers: "scalar", "distribution" or "histogram".
+const char* kindText(KeyKind kind);
 /// The kind of a part in JSON and CSV: "all", "value", "not_reported" or "other".
 const char* kindText(const PartName& name);
 /// The members "part" and "group"; the group is null unless the part is a value.

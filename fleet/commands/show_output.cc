@@ -196,7 +196,7 @@ Json setJson(const ShownSet& set) {
 
 /// The first columns of a row.
 void addNames(CsvWriter& csv, const ShowAnswer& answer, const ShowSide& side, const ShownSet& set) {
-  csv.text(answer.request.key).title(kindText(answer)).text(side.title);
+  csv.text(answer.request.key).title(kindText(answer.request.kind)).text(side.title);
   csv.title(kindText(set.name)).text(set.name.value);
 }
 
@@ -207,14 +207,10 @@ std::string bucketText(double lower, double upper) {
          (std::isinf(upper) ? "inf)" : numberText(upper) + "]");
 }
 
-const char* kindText(const ShowAnswer& answer) {
-  return answer.request.kind == KeyKind::kScalar ? "scalar" : "distribution";
-}
-
 void printShown(FleetContext& context, const ShowAnswer& answer, bool buckets) {
   std::ostream& out = context.out();
   const std::string& key = answer.request.key;
-  out << printable(key) << ": " << kindText(answer);
+  out << printable(key) << ": " << kindText(answer.request.kind);
   if (const catalogue::Entry* entry = catalogue::findStatistic(key)) {
     if (!entry->unit.empty()) out << ", in " << entry->unit;
     if (!entry->meaning.empty()) out << "\n" << entry->meaning;
@@ -257,7 +253,7 @@ Json shownJson(const ShowAnswer& answer) {
   }
   const catalogue::Entry* entry = catalogue::findStatistic(answer.request.key);
   return {{"key", answer.request.key},
-          {"kind", kindText(answer)},
+          {"kind", kindText(answer.request.kind)},
           {"unit", entry != nullptr ? entry->unit : ""},
           {"meaning", entry != nullptr ? entry->meaning : ""},
           {"sides", std::move(sides)}};

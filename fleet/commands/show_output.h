@@ -20,7 +20,5 @@ void printBucketsCsv(std::ostream& out, const std::vector<ShowAnswer>& answers);
 
 /// "(10, 20]", and "(20, inf)" for the last bucket, as in a log.
 std::string bucketText(double lower, double upper);
-/// "scalar" or "distribution".
-const char* kindText(const ShowAnswer& answer);
 
 }  // namespace tavrel::fleet

@@ -38,12 +38,6 @@ std::string date(std::int32_t day) {
   return dateText(civilFromDays(day));
 }
 
-const char* kindName(KeyKind kind) {
-  return kind == KeyKind::kScalar         ? "scalar"
-         : kind == KeyKind::kDistribution ? "distribution"
-                                          : "histogram";
-}
-
 void printText(FleetContext& context, const SummaryAnswer& answer) {
   std::ostream& out = context.out();
   if (!answer.isShown) {
@@ -129,7 +123,7 @@ void printKeys(FleetContext& context, const QuestionOptions& options, const std:
     for (const Key& key : keys) {
       const catalogue::Entry entry = entryOf(key);
       list.push_back({{"key", key.name},
-                      {"kind", kindName(key.kind)},
+                      {"kind", kindText(key.kind)},
                       {"unit", entry.unit},
                       {"meaning", entry.meaning}});
     }
@@ -140,14 +134,14 @@ void printKeys(FleetContext& context, const QuestionOptions& options, const std:
     csv.titles({"key", "kind", "unit", "meaning"});
     for (const Key& key : keys) {
       const catalogue::Entry entry = entryOf(key);
-      csv.text(key.name).title(kindName(key.kind)).title(entry.unit).title(entry.meaning).endRow();
+      csv.text(key.name).title(kindText(key.kind)).title(entry.unit).title(entry.meaning).endRow();
     }
     return;
   }
   Table table({{"KEY", Table::Align::Whole}, {"KIND", Table::Align::Whole}, {"UNIT"}, {"MEANING"}});
   for (const Key& key : keys) {
     const catalogue::Entry entry = entryOf(key);
-    table.add({key.name, kindName(key.kind), std::string(entry.unit), std::string(entry.meaning)});
+    table.add({key.name, kindText(key.kind), std::string(entry.unit), std::string(entry.meaning)});
   }
   if (table.empty()) {
     context.out() << "no statistic of at least " << devicesAtLeast << " devices\n";

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 
+#include "base/ascii.h"
 #include "base/civil_time.h"
 
 namespace tavrel::fleet {
@@ -9,10 +10,6 @@ namespace tavrel::fleet {
 namespace {
 
 constexpr std::size_t kMostGroups = 1000;
-
-bool isDigit(char c) {
-  return c >= '0' && c <= '9';
-}
 
 std::size_t digitsFrom(std::string_view text, std::size_t begin) {
   std::size_t end = begin;

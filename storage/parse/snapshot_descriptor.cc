@@ -57,10 +57,8 @@ Status addField(SnapshotDescriptor& out, ByteSpan entry, std::size_t index,
   const auto field = makeSnapshotField(kKinds[kind], *loadLittle32(entry, kEntryOffset),
                                        *loadLittle32(entry, kEntrySize), *text);
   if (!field) {
-    std::string quoted;
-    appendQuoted(quoted, *text);
-    return Error{format("the format %s of field %zu asks for what kind %zu does not give", quoted,
-                        index, kind)};
+    return Error{format("the format %s of field %zu asks for what kind %zu does not give",
+                        quotedText(*text), index, kind)};
   }
   if (text->empty() && field->triples == 0) return Done{};
   out.fields.push_back(*field);

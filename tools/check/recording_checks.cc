@@ -1,6 +1,5 @@
 // What programs record: limits reached, values lost, and folding.
 #include <algorithm>
-#include <cerrno>
 #include <ctime>
 #include <string>
 #include <unistd.h>
@@ -9,6 +8,7 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/fold_notes.h"
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/recorders.h"
@@ -72,17 +72,13 @@ bool hasClosedSegments(const SegmentFolder::Listing& listing) {
          });
 }
 
-bool isClosed(const std::string& path) {
-  return access(path.c_str(), R_OK) != 0 && errno == EACCES;
-}
-
 // Why limits may not be enforced: a fault in their file, or a failure of the last tidy.
 void judgeTidying(CheckScene& scene, Check& check) {
   LinuxPlatform& device = scene.context.linuxPlatform();
   const auto limits =
       DeviceLimits::read(device.root(), device.fileSystem(), device.platform().propertyLists);
   if (!limits) {
-    const bool mayRead = !isClosed(device.root().path(kLimitsPath));
+    const bool mayRead = !FileSystem::isClosed(device.root().path(kLimitsPath));
     return addFinding(check, mayRead ? CheckState::Warning : CheckState::Unknown,
                       limits.error().message);
   }
@@ -205,7 +201,7 @@ void checkRecording(CheckScene& scene) {
     scene.checks.push_back(foldingCheck(scene, recorders, **folder));
   }
   if (!fault.text.empty()) {
-    const bool isUnseen = isClosed(root.path(kRecordersFile));
+    const bool isUnseen = FileSystem::isClosed(root.path(kRecordersFile));
     addFinding(scene.checks.back(), isUnseen ? CheckState::Unknown : CheckState::Warning,
                fault.text);
   }

@@ -66,8 +66,8 @@ void examine(CheckScene& scene, const std::string& path, Check& check) {
   const auto found = history ? (*history)->examine(scene.examination)
                              : Expected<SqliteHistory::Examination>(history.error());
   if (!found) {
-    const bool isClosed = access(path.c_str(), R_OK) != 0 && errno == EACCES;
-    return addFinding(check, isClosed ? CheckState::Unknown : CheckState::Critical,
+    return addFinding(check,
+                      FileSystem::isClosed(path) ? CheckState::Unknown : CheckState::Critical,
                       found.error().message);
   }
   if (!found->fault.empty()) {

@@ -4,6 +4,7 @@
 #include <optional>
 #include <utility>
 
+#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "page/charts.h"
@@ -60,7 +61,6 @@ Trend trendOf(const PageScene& scene, const Disk& disk, const Wear& wear) {
       format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
   if (known == scene.recorded.scalars.end() || known->second.days.empty()) return trend;
   constexpr double kMostPerDay = 5;
-  constexpr double kSecondsPerDay = 86'400;
   const double step = wear.figure == "used_pct" ? 1 : 10;
   double lastDay = known->second.days.front().first;
   auto lastPercent = static_cast<double>(known->second.days.front().second);

@@ -51,13 +51,6 @@ void noteFailure(SystemLog& log, std::string_view what, const std::string& folde
           folder, systemText(code));
 }
 
-// A path as the user who made it may have chosen it.
-std::string quoted(std::string_view path) {
-  std::string text;
-  appendQuoted(text, path);
-  return text;
-}
-
 std::vector<DataFolder> dataFolders(const DeviceRoot& root, SystemLog& log) {
   std::vector<DataFolder> folders;
   const auto addHome = [&](const std::string& home) {
@@ -132,7 +125,7 @@ class Enumeration {
         log_.log(
             LogLevel::Error,
             "more than %zu files and folders among desktop entries; those from %s on do not count",
-            limits::kDesktopFiles, quoted(path));
+            limits::kDesktopFiles, quotedText(path));
         isFull_ = true;
       } else if (path.ends_with(".desktop")) {
         take(path, prefix + entry.d_name, bundleType);
@@ -152,7 +145,7 @@ class Enumeration {
       log_.log(
           LogLevel::Error,
           "desktop entries nested more than %d folders deep do not count, as in %s; move them up",
-          limits::kDesktopFolderDepth, quoted(path));
+          limits::kDesktopFolderDepth, quotedText(path));
     }
     return true;
   }
@@ -162,7 +155,7 @@ class Enumeration {
     if (seen_.contains(hash)) return;
     if (seen_.size() == limits::kDesktopEntries) {
       log_.log(LogLevel::Error, "more than %zu desktop entries; those from %s on do not count",
-               limits::kDesktopEntries, quoted(path));
+               limits::kDesktopEntries, quotedText(path));
       isFull_ = true;
       return;
     }
@@ -172,7 +165,7 @@ class Enumeration {
     if (entry.errorNumber != 0 && !isNoEntry(entry.errorNumber) &&
         !std::exchange(isUnreadTold_, true)) {
       log_.log(LogLevel::Error, "cannot read %s: %s; not all applications are counted",
-               quoted(path), systemText(entry.errorNumber));
+               quotedText(path), systemText(entry.errorNumber));
     }
   }
 

@@ -7,6 +7,7 @@
 #include <fcntl.h>
 #include <sys/file.h>
 #include <time.h>
+#include <unistd.h>
 
 #include "base/limits.h"
 #include "platform/linux/files/folder_walk.h"
@@ -160,6 +161,10 @@ std::optional<struct stat> FileSystem::status(const std::string& path) {
   struct stat status {};
   if (::stat(path.c_str(), &status) != 0) return std::nullopt;
   return status;
+}
+
+bool FileSystem::isClosed(const std::string& path) {
+  return access(path.c_str(), R_OK) != 0 && errno == EACCES;
 }
 
 // -- Writing ------------------------------------------------------------------------------------

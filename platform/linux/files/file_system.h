@@ -153,6 +153,8 @@ class FileSystem {
 
   /// Status of a file, links followed; nothing when it cannot be taken.
   static std::optional<struct stat> status(const std::string& path);
+  /// Whether the permissions keep this user from reading it.
+  static bool isClosed(const std::string& path);
 
  protected:
   /// System calls: -1 with `errno` on failure. `openFile` sets close-on-exec.

@@ -28,7 +28,7 @@ std::string preciseStamp(plist::Date instant) {
 }
 
 std::int64_t dayOf(plist::Date instant) {
-  return daysFromCivil(civilFromSeconds(wholeSeconds(instant)).date);
+  return dayOfSecond(wholeSeconds(instant));
 }
 
 }  // namespace tavrel

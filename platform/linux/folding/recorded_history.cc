@@ -2,11 +2,10 @@
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
-#include <unistd.h>
 #include <utility>
 
 #include "base/arithmetic.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/fold_notes.h"
 
 namespace tavrel {
@@ -17,10 +16,6 @@ constexpr int kAttempts = 5;
 
 bool isSame(const timespec& a, const timespec& b) {
   return a.tv_sec == b.tv_sec && a.tv_nsec == b.tv_nsec;
-}
-
-bool mayNotRead(const std::string& path) {
-  return access(path.c_str(), R_OK) != 0 && errno == EACCES;
 }
 
 /// The values of a row: those in the store, then the waiting ones.
@@ -113,7 +108,7 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
       history.stored_ = *std::move(stored);
       history.storeFault_.reset();
       if (Status begun = history.stored_->beginSnapshot(); !begun) return begun.error();
-    } else if (folder && *folder && mayNotRead(store.path())) {
+    } else if (folder && *folder && FileSystem::isClosed(store.path())) {
       history.stored_.reset();
       history.storeFault_ = stored.error();
     } else {

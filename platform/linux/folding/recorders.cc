@@ -67,9 +67,7 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
 void Recorders::add(std::string_view user, const plist::Value& prefixes, const std::string& path,
                     SystemLog& log) {
   const auto complain = [&](std::string_view what, LogLevel level = LogLevel::Error) {
-    std::string shown;
-    appendQuoted(shown, user.substr(0, 60));
-    log.log(level, "%s: the entry %s %s", path, shown, what);
+    log.log(level, "%s: the entry %s %s", path, quotedText(user.substr(0, 60)), what);
   };
   const plist::Array array = prefixes.array();
   if (!array) return complain("is ignored: give an array of prefixes");

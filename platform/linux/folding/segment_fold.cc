@@ -298,12 +298,10 @@ Expected<std::optional<FoldRun::Stored>> FoldRun::storedPosition(SqliteBatch& ba
 void FoldRun::count(const SegmentName& name, const SegmentIntake& intake,
                     const SegmentProgress& progress) {
   if (!intake.foreignKey().empty() && toldUsers_.insert(name.owner).second) {
-    std::string key;
-    appendQuoted(key, std::string_view(intake.foreignKey()).substr(0, 80));
     notes_.tell(
         format("user %u may not record %s, and such values are refused: give the user a "
                "prefix in /etc/tavrel/recorders.plist, or use another key",
-               name.owner, key));
+               name.owner, quotedText(std::string_view(intake.foreignKey()).substr(0, 80))));
   }
   ++counts_.segments;
   counts_.scalars += intake.scalars();

@@ -198,9 +198,8 @@ bool SegmentFolder::remove(const OpenSegment& segment) const {
 
 std::string SegmentFolder::refusal(std::string_view name, std::string_view reason,
                                    std::string_view advice) const {
-  std::string line;
-  appendQuoted(line, name.substr(0, 80));
-  return line.append(" in ")
+  return quotedText(name.substr(0, 80))
+      .append(" in ")
       .append(path_)
       .append(" is refused: ")
       .append(reason)

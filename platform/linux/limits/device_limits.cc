@@ -23,11 +23,9 @@ constexpr Range kDays{1, 36'500};
 // A day's log with its metadata takes two blocks of 4 KiB.
 constexpr Range kBytes{64 << 10, std::int64_t{1} << 40};
 
-std::string quoted(std::string_view name) {
-  constexpr std::size_t kShownBytes = 60;
-  std::string text;
-  appendQuoted(text, name.substr(0, kShownBytes));
-  return text;
+// The beginning of a long name is enough.
+std::string shown(std::string_view name) {
+  return quotedText(name.substr(0, 60));
 }
 
 std::string kindNames() {
@@ -91,7 +89,7 @@ Status DeviceLimits::apply(const plist::Dictionary& content) {
     const auto kind = std::ranges::find_if(
         kKeptKinds, [&](const KeptKind& known) { return entry.key == known.name; });
     if (kind == kKeptKinds.end()) {
-      return Error{format("%s is not a limit; they are %s", quoted(entry.key), kindNames())};
+      return Error{format("%s is not a limit; they are %s", shown(entry.key), kindNames())};
     }
     const plist::Dictionary given = entry.value.dictionary();
     if (!given) return Error{format("%s must be a dictionary", kind->name)};
@@ -100,7 +98,7 @@ Status DeviceLimits::apply(const plist::Dictionary& content) {
       const std::string place = std::string(kind->name) + "/" + std::string(bound.key.view());
       const bool isDays = bound.key == kDaysKey && kind->bounds.days != kAnyDays;
       if (!isDays && bound.key != kBytesKey) {
-        return Error{format("%s has no limit %s; it has %s", kind->name, quoted(bound.key),
+        return Error{format("%s has no limit %s; it has %s", kind->name, shown(bound.key),
                             kind->bounds.days == kAnyDays ? "Bytes" : "Days and Bytes")};
       }
       const Status applied = isDays ? applyBound(bounds.days, bound.value, kDays, place)

@@ -34,10 +34,6 @@ std::int64_t blocksOf(const struct stat& status) {
   return (status.st_size + kBlockBytes - 1) / kBlockBytes * kBlockBytes;
 }
 
-std::int64_t dayOfSecond(std::int64_t seconds) {
-  return (seconds - secondOfDay(seconds)) / kSecondsPerDay;
-}
-
 // The names of preferences in use may contain ".corrupt-", too; those set aside end in a stamp.
 bool isSetAside(std::string_view name) {
   return (name.find(".corrupt-") != name.npos && !name.ends_with(".plist")) ||

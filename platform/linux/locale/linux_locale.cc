@@ -131,10 +131,9 @@ std::vector<std::string> LinuxLocale::systemLanguages() {
   LanguageList listed;
   const bool present = readLines(kLanguagesFile, [&](std::string_view line) {
     if (listed.addNamed(line)) return;
-    std::string message = root_.path(kLanguagesFile) + ": ";
-    appendQuoted(message, line);
-    message += " is not a language; write one tag per line, such as de or pt-BR";
-    log_.write(LogLevel::Error, message);
+    log_.log(LogLevel::Error,
+             "%s: %s is not a language; write one tag per line, such as de or pt-BR",
+             root_.path(kLanguagesFile), quotedText(line));
   });
   if (present) return listed.take();
 

@@ -30,8 +30,7 @@ std::string withoutEnding(const std::string& file, std::string_view ending) {
 std::tuple<bool, std::int64_t, std::string_view> removalKey(std::int64_t seconds,
                                                             std::string_view name,
                                                             std::int64_t today) {
-  const std::int64_t day = (seconds - secondOfDay(seconds)) / kSecondsPerDay;
-  return {!isAhead(day, today), seconds, name};
+  return {!isAhead(dayOfSecond(seconds), today), seconds, name};
 }
 
 LogFolder::LogFolder(std::string_view submission, std::string_view name, FileSystem& files)

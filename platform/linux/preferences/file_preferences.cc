@@ -17,12 +17,6 @@ constexpr mode_t kMode = 0640;
 
 static_assert(Preferences::kLargestChange <= limits::kPreferenceFileBytes / 8);
 
-std::string quoted(std::string_view text) {
-  std::string out;
-  appendQuoted(out, text);
-  return out;
-}
-
 }  // namespace
 
 FilePreferences::FilePreferences(const DeviceRoot& root, FileSystem& files,
@@ -63,8 +57,8 @@ void FilePreferences::ZTXPreferencesSetValue(std::string_view key, const plist::
     log_.log(LogLevel::Error,
              "cannot set preference %s: %s is not the name of a domain; use 1 to %d characters, "
              "no slash or control character, and no dot in front",
-             quoted(key.substr(0, limits::kPreferenceDomainBytes)),
-             quoted(domain.substr(0, limits::kPreferenceDomainBytes)),
+             quotedText(key.substr(0, limits::kPreferenceDomainBytes)),
+             quotedText(domain.substr(0, limits::kPreferenceDomainBytes)),
              static_cast<int>(limits::kPreferenceDomainBytes));
     return;
   }
@@ -204,7 +198,7 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
 
   const auto drop = [&](const std::string& key, const std::string& why) {
     log_.log(LogLevel::Error, "cannot write preference %s of domain %s: %s; it is dropped",
-             quoted(key.substr(0, limits::kPreferenceDomainBytes)), name, why);
+             quotedText(key.substr(0, limits::kPreferenceDomainBytes)), name, why);
     merged.set(key, stored.get(key));
     domain.changes.erase(key);
   };

@@ -34,14 +34,9 @@ struct Instant {
 };
 
 std::optional<Instant> dayAndSecond(std::int64_t seconds) {
-  std::int64_t day = seconds / kSecondsPerDay;
-  std::int64_t rest = seconds % kSecondsPerDay;
-  if (rest < 0) {
-    rest += kSecondsPerDay;
-    --day;
-  }
+  const std::int64_t day = dayOfSecond(seconds);
   if (day != static_cast<std::int32_t>(day)) return std::nullopt;
-  return Instant{static_cast<std::int32_t>(day), static_cast<std::uint32_t>(rest)};
+  return Instant{static_cast<std::int32_t>(day), secondOfDay(seconds)};
 }
 
 // The same for many instants of mostly the same day, without divisions.

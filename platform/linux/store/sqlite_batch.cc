@@ -99,9 +99,14 @@ void SqliteBatch::removeTakenValues() {
 // Closing the connection rolls an unfinished transaction back.
 SqliteBatch::~SqliteBatch() = default;
 
-Error SqliteBatch::fail(const StoreFailure& failure) {
-  if (failure.fault == StoreFault::Damaged) damage_ = {file_, failure};
-  return Error{site_.describe(failure)};
+template <class Operation>
+std::invoke_result_t<Operation> SqliteBatch::attempt(Operation operation) {
+  try {
+    return operation();
+  } catch (const StoreFailure& failure) {
+    if (failure.fault == StoreFault::Damaged) damage_ = {file_, failure};
+    return Error{site_.describe(failure)};
+  }
 }
 
 void SqliteBatch::putScalar(std::int32_t day, std::string_view key, std::int64_t value) {
@@ -138,12 +143,10 @@ void SqliteBatch::writeScalar(std::int32_t day, std::string_view key, std::int64
 }
 
 Status SqliteBatch::setScalar(std::int32_t day, std::string_view key, std::int64_t value) {
-  try {
+  return attempt([&]() -> Status {
     putScalar(day, key, value);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 std::optional<std::int64_t> SqliteBatch::readScalar(std::int32_t day, std::string_view key) {
@@ -160,15 +163,11 @@ std::optional<std::int64_t> SqliteBatch::readScalar(std::int32_t day, std::strin
 }
 
 Expected<std::optional<std::int64_t>> SqliteBatch::scalar(std::int32_t day, std::string_view key) {
-  try {
-    return readScalar(day, key);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
+  return attempt([&]() -> Expected<std::optional<std::int64_t>> { return readScalar(day, key); });
 }
 
 Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64_t amount) {
-  try {
+  return attempt([&]() -> Status {
     const std::int64_t value = readScalar(day, key).value_or(0);
     std::int64_t sum = 0;
     if (__builtin_add_overflow(value, amount, &sum)) {
@@ -176,10 +175,8 @@ Status SqliteBatch::addScalar(std::int32_t day, std::string_view key, std::int64
                    " goes beyond 64 bits: set the value instead"};
     }
     writeScalar(day, key, sum);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 Status SqliteBatch::appendValue(std::int32_t day, std::string_view key,
@@ -192,7 +189,7 @@ Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
                                  std::span<const DistributionSample> samples) {
   // In parts, so that a large span does not exceed the bound of waiting values either.
   constexpr std::size_t kAtOnce = kPendingBytes / (kPackedValueBytes + kPackedOffsetBytes);
-  try {
+  return attempt([&]() -> Status {
     checkKey(key);
     while (!samples.empty()) {
       const auto taken = samples.first(std::min(samples.size(), kAtOnce));
@@ -200,77 +197,61 @@ Status SqliteBatch::appendValues(std::int32_t day, std::string_view key,
       if (distributions_.bytes() >= kPendingBytes) writeDistributions();
       samples = samples.subspan(taken.size());
     }
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 Status SqliteBatch::limitWaiting() {
-  try {
+  return attempt([&]() -> Status {
     if (distributions_.bytes() >= kPendingBytes) writeDistributions();
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 Expected<std::optional<std::string>> SqliteBatch::segmentPosition(std::uint32_t owner,
                                                                   SegmentIdentity identity) {
-  try {
+  return attempt([&]() -> Expected<std::optional<std::string>> {
     begin();
     return segment_table::position(connection_, owner, identity);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
+  });
 }
 
 Expected<std::vector<SegmentName>> SqliteBatch::segmentNames() {
-  try {
+  return attempt([&]() -> Expected<std::vector<SegmentName>> {
     begin();
     return segment_table::names(connection_);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
+  });
 }
 
 Expected<std::int64_t> SqliteBatch::segmentPositionBytes(std::uint32_t owner) {
-  try {
+  return attempt([&]() -> Expected<std::int64_t> {
     begin();
     return segment_table::positionBytes(connection_, owner);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
+  });
 }
 
 Expected<std::int64_t> SqliteBatch::bytesInUse() {
-  try {
+  return attempt([&]() -> Expected<std::int64_t> {
     begin();
     return bytesInUseOf(connection_);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
+  });
 }
 
 Status SqliteBatch::setSegmentPosition(std::uint32_t owner, SegmentIdentity identity,
                                        std::string_view position) {
-  try {
+  return attempt([&]() -> Status {
     begin();
     segment_table::setPosition(connection_, owner, identity, position);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 Status SqliteBatch::removeSegmentPosition(std::uint32_t owner, SegmentIdentity identity) {
-  try {
+  return attempt([&]() -> Status {
     begin();
     segment_table::removePosition(connection_, owner, identity);
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 void SqliteBatch::writeDistributions() {
@@ -284,10 +265,8 @@ void SqliteBatch::writeDistributions() {
         } catch (const RowFailure& failure) {
           if (!refuses_) throw;
           if (refused_ == 0) {
-            std::string quoted;
-            appendQuoted(quoted, key.substr(0, 80));
-            site_.tell(failure, "; what was recorded for " + quoted + " on day " +
-                                    std::to_string(day) + " is refused");
+            site_.tell(failure, "; what was recorded for " + quotedText(key.substr(0, 80)) +
+                                    " on day " + std::to_string(day) + " is refused");
           }
           refused_ += added.values.size() / kPackedValueBytes;
         }
@@ -296,12 +275,10 @@ void SqliteBatch::writeDistributions() {
 }
 
 Expected<std::uint64_t> SqliteBatch::refusedValues() {
-  try {
+  return attempt([&]() -> Expected<std::uint64_t> {
     writeDistributions();
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return refused_;
+    return refused_;
+  });
 }
 
 void SqliteBatch::finish() {
@@ -332,12 +309,10 @@ void SqliteBatch::limitLog() {
 }
 
 Status SqliteBatch::commit() {
-  try {
+  return attempt([&]() -> Status {
     finish();
-  } catch (const StoreFailure& failure) {
-    return fail(failure);
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 }  // namespace tavrel

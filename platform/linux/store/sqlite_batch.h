@@ -18,6 +18,7 @@
 #include <span>
 #include <string>
 #include <string_view>
+#include <type_traits>
 #include <vector>
 
 #include "base/expected.h"
@@ -117,7 +118,9 @@ class SqliteBatch {
   std::optional<std::int64_t> readScalar(std::int32_t day, std::string_view key);
   void writeScalar(std::int32_t day, std::string_view key, std::int64_t value);
   void writeDistributions();
-  Error fail(const StoreFailure& failure);
+  /// The outcome of `operation`, or the failure that it throws.
+  template <class Operation>
+  std::invoke_result_t<Operation> attempt(Operation operation);
 
   SqliteConnection connection_;
   StoreSite site_;

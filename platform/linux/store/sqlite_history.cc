@@ -15,11 +15,8 @@ namespace {
 
 StoreFailure inDistribution(std::string_view key, std::int32_t day, const StoreFailure& failure) {
   // The beginning of a long key is enough.
-  constexpr std::size_t kShownBytes = 200;
-  std::string message = "distribution ";
-  appendQuoted(message, key.substr(0, kShownBytes));
-  message += " of day " + std::to_string(day) + ": " + failure.message;
-  return {failure.fault, std::move(message)};
+  return {failure.fault, "distribution " + quotedText(key.substr(0, 200)) + " of day " +
+                             std::to_string(day) + ": " + failure.message};
 }
 
 class ChunkEnumerator : public BHHistoryDistributionEnumerator {
