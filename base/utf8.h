@@ -1,7 +1,6 @@
 // UTF-8: validation, and reading text code point by code point.
 #pragma once
 
-#include <cstdint>
 #include <string>
 #include <string_view>
 

@@ -1,6 +1,5 @@
 #include "daemon/tasking.h"
 
-#include <cstdlib>
 #include <set>
 #include <string>
 

@@ -4,7 +4,6 @@
 // the number of days since 1970-01-01 UTC.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <memory>

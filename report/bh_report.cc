@@ -1,7 +1,5 @@
 #include "report/bh_report.h"
 
-#include "base/arithmetic.h"
-
 namespace tavrel {
 
 BHReport::BHReport(Platform& platform) : platform_(platform), _config(BHConfig::init(platform)) {}

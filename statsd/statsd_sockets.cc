@@ -1,6 +1,5 @@
 #include "statsd/statsd_sockets.h"
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <fcntl.h>

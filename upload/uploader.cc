@@ -14,7 +14,6 @@
 #include "base/format.h"
 #include "base/iso_date.h"
 #include "base/limits.h"
-#include "base/version.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/stamp.h"
 #include "platform/linux/files/system_error.h"

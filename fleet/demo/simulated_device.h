@@ -5,7 +5,6 @@
 #include <random>
 #include <string>
 
-#include "base/plist.h"
 #include "platform/linux/files/digests.h"
 #include "tests/fakes/fake_platform.h"
 

@@ -8,7 +8,6 @@
 #include <utility>
 
 #include "base/format.h"
-#include "fleet/logs/limits.h"
 #include "fleet/logs/xml_value.h"
 
 namespace tavrel::fleet {

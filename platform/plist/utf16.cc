@@ -1,7 +1,5 @@
 #include "platform/plist/utf16.h"
 
-#include <cstdint>
-
 #include "base/utf8.h"
 
 namespace tavrel::plist {

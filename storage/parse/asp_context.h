@@ -12,9 +12,7 @@
 #pragma once
 
 #include <array>
-#include <cstddef>
 #include <cstdint>
-#include <string_view>
 
 #include "storage/parse/asp_entries.h"
 

@@ -6,7 +6,6 @@
 // that is a number or a list of numbers: "IntermediateWamp:1.37;ValidityList[0]:12,40,7".
 #pragma once
 
-#include <cstdint>
 #include <string>
 #include <string_view>
 

@@ -1,7 +1,6 @@
 // The checks, grouped by subject. Each function adds one or more checks to the list.
 #pragma once
 
-#include <optional>
 #include <string_view>
 #include <vector>
 

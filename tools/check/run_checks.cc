@@ -1,6 +1,5 @@
 // Permission, clock, and the last run with its log.
 #include "base/arithmetic.h"
-#include "base/civil_time.h"
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/linux_platform.h"

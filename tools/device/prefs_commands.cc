@@ -5,7 +5,6 @@
 #include <ostream>
 
 #include "base/format.h"
-#include "base/limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"

@@ -15,7 +15,6 @@
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
 #include "platform/linux/service/service_socket.h"
-#include "platform/persisted_state.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/table.h"

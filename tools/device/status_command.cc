@@ -1,7 +1,6 @@
 #include "tools/device/status_command.h"
 
 #include <nlohmann/json.hpp>
-#include <ostream>
 
 #include "base/arithmetic.h"
 #include "base/format.h"

@@ -1,4 +1,3 @@
-#include <cmath>
 #include <limits>
 
 #include "ioreport/elements.h"

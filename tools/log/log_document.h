@@ -1,8 +1,6 @@
 // Shows a tallied log to people and programs.
 #pragma once
 
-#include <cstdint>
-#include <optional>
 #include <string>
 #include <utility>
 #include <vector>

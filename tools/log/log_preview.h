@@ -8,7 +8,6 @@
 #include <string_view>
 #include <vector>
 
-#include "report/log_outcome.h"
 #include "tools/overlay/captured_log.h"
 #include "tools/shared/tool_context.h"
 

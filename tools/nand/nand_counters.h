@@ -2,7 +2,6 @@
 #pragma once
 
 #include <iosfwd>
-#include <optional>
 #include <string_view>
 
 #include "storage/telemetry_counters.h"

@@ -1,7 +1,5 @@
 #include "tools/overlay/overlay_reads.h"
 
-#include <cstring>
-
 #include "base/format.h"
 #include "base/system_text.h"
 

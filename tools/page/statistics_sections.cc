@@ -1,6 +1,5 @@
 // The statistics of the day, both exact and as they leave the device.
 #include <algorithm>
-#include <cmath>
 
 #include "base/format.h"
 #include "base/text.h"

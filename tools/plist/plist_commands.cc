@@ -2,7 +2,6 @@
 
 #include <memory>
 #include <nlohmann/json.hpp>
-#include <ostream>
 
 #include "base/format.h"
 #include "platform/plist/binary.h"

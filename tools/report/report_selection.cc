@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <iterator>
 #include <unordered_set>
-#include <utility>
 
 #include "base/format.h"
 #include "base/parse_number.h"

@@ -1,7 +1,6 @@
 #include "tools/shared/typed_value.h"
 
 #include <algorithm>
-#include <optional>
 
 #include "base/format.h"
 #include "base/iso_date.h"

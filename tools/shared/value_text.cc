@@ -1,6 +1,5 @@
 #include "tools/shared/value_text.h"
 
-#include <cmath>
 #include <ostream>
 
 #include "base/format.h"

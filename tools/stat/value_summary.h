@@ -11,9 +11,7 @@
 // Values that are not numbers are counted and otherwise ignored.
 #pragma once
 
-#include <array>
 #include <cstdint>
-#include <optional>
 #include <span>
 #include <string>
 #include <vector>

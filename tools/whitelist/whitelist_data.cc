@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cmath>
 #include <optional>
-#include <span>
 
 #include "base/format.h"
 #include "base/limits.h"

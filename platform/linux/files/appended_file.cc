@@ -1,7 +1,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include "platform/linux/files/file_system.h"

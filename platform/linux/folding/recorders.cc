@@ -8,7 +8,6 @@
 #include <pwd.h>
 #include <unistd.h>
 
-#include "base/limits.h"
 #include "base/text.h"
 #include "client/segment_format.h"
 #include "platform/linux/files/property_list_file.h"

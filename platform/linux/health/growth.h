@@ -12,7 +12,6 @@
 #include <optional>
 #include <set>
 #include <string>
-#include <string_view>
 
 #include "base/bytes.h"
 #include "base/expected.h"

@@ -1,7 +1,6 @@
 #include "platform/linux/health/reader.h"
 
 #include <algorithm>
-#include <sys/stat.h>
 #include <utility>
 
 #include "base/format.h"

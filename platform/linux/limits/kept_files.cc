@@ -5,7 +5,6 @@
 #include <utility>
 
 #include "base/civil_time.h"
-#include "base/limits.h"
 #include "platform/linux/device/ecc_events.h"
 #include "platform/linux/logs/record_file_name.h"
 #include "platform/linux/preferences/file_preferences.h"

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cerrno>
-#include <utility>
 
 #include "base/civil_time.h"
 #include "base/limits.h"

@@ -14,7 +14,6 @@
 #include <string_view>
 
 #include "base/expected.h"
-#include "base/plist.h"
 
 namespace tavrel {
 

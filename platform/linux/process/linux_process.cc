@@ -1,6 +1,5 @@
 #include "platform/linux/process/linux_process.h"
 
-#include <errno.h>
 #include <unistd.h>
 
 namespace tavrel {

@@ -1,7 +1,6 @@
 // The folder of recordings, /var/lib/tavrel/registry under the device root.
 #pragma once
 
-#include <cstdint>
 #include <ctime>
 #include <string>
 #include <string_view>

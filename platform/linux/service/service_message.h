@@ -9,7 +9,6 @@
 //   if (auto* message = std::get_if<plist::Dictionary>(&received)) use(*message);
 #pragma once
 
-#include <string>
 #include <variant>
 
 #include "base/bytes.h"

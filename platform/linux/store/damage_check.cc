@@ -3,8 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
-#include <cstdint>
-#include <cstring>
 #include <fcntl.h>
 #include <sqlite3.h>
 #include <unistd.h>

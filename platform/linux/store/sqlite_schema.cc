@@ -1,7 +1,6 @@
 #include "platform/linux/store/sqlite_schema.h"
 
 #include <cerrno>
-#include <cstring>
 #include <ctime>
 #include <fcntl.h>
 #include <sqlite3.h>

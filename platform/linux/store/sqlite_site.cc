@@ -1,8 +1,6 @@
 #include "platform/linux/store/sqlite_site.h"
 
 #include <cerrno>
-#include <cstring>
-#include <fcntl.h>
 #include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>

@@ -8,7 +8,6 @@
 #include <string>
 #include <string_view>
 
-#include "base/expected.h"
 #include "platform/clock.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/sqlite_connection.h"

@@ -11,7 +11,6 @@
 // stays.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <functional>
 #include <sys/types.h>
