@@ -1,5 +1,7 @@
 #include "fleet/loading/reading_threads.h"
 
+#include <algorithm>
+#include <iterator>
 #include <utility>
 
 namespace tavrel::fleet {
@@ -97,16 +99,26 @@ void ReadingThreads::readPieces() {
       waiting_.pop_front();
     }
     std::size_t bytes = 0;
+    std::shared_ptr<Piece> rest;
     try {
-      for (SourceItem& item : piece->found) {
-        piece->read.push_back(readItem(std::move(item), reader, permitted_));
+      auto item = piece->found.begin();
+      for (; item != piece->found.end() && bytes < kPieceBytes; ++item) {
+        piece->read.push_back(readItem(std::move(*item), reader, permitted_));
         bytes += piece->read.back().bytes;
+      }
+      if (item != piece->found.end()) {
+        rest = std::make_shared<Piece>();
+        rest->found.assign(std::move_iterator(item), std::move_iterator(piece->found.end()));
       }
     } catch (...) {
       noteFailure();
     }
     piece->found.clear();
     const std::lock_guard lock(mutex_);
+    if (rest) {
+      order_.insert(std::ranges::find(order_, piece) + 1, rest);
+      waiting_.push_front(std::move(rest));
+    }
     bytes_ += bytes;
     piece->bytes += bytes;
     piece->isRead = true;

@@ -38,6 +38,7 @@ class ReadingThreads {
  private:
   struct Stopped {};
   // Items that one thread reads in a row, which makes the threads wait for each other less often.
+  // A piece ends after a large one, which shows only when it is read; the rest becomes another.
   struct Piece {
     std::vector<SourceItem> found;
     std::vector<ReadItem> read;

@@ -8,6 +8,8 @@
 #include "base/format.h"
 #include "base/text.h"
 #include "fleet/fleet_tool.h"
+#include "fleet/loading/reading_threads.h"
+#include "fleet/sources/sources.h"
 #include "platform/linux/files/digests.h"
 #include "tests/fleet/loading/sample_log.h"
 #include "tests/platform/temporary_root.h"
@@ -344,6 +346,24 @@ TEST_F(LoadTest, FilesOnceWhatTwoLoadersBring) {
             (std::multiset<std::string>{format("%d|%d", kLogs, kLogs)}));
   EXPECT_EQ(rows("SELECT count(*) FROM scalar"),
             (std::multiset<std::string>{std::to_string(2 * kLogs)}));
+}
+
+TEST_F(LoadTest, ReadsNoFurtherAheadThanItsMemoryAllows) {
+  const std::string large = gzipped(std::string(60U << 20, 'x'));
+  for (int i = 0; i < 8; ++i)
+    write(format("large/%d.log", i), large);
+  const PermittedKeys all;
+  ReadingThreads reading([&](const SourceSink& sink) { visitSources(at("large"), {}, sink); }, all,
+                         1);
+  while (!reading.isMoreRead())
+    std::this_thread::yield();
+  for (int i = 4; i < 8; ++i)
+    std::filesystem::remove(at(format("large/%d.log", i)));
+  std::multiset<std::string> reasons;
+  while (const auto item = reading.next())
+    reasons.insert(item->source.reason);
+  EXPECT_EQ(reasons.count("is not a property list"), 4U);
+  EXPECT_EQ(reasons.count("cannot be read: No such file or directory"), 4U);
 }
 
 TEST_F(LoadTest, SaysHowItIsUsed) {
