@@ -139,6 +139,8 @@ TEST(EngineFaults, LetsOtherUsersQuery) {
   const std::string path = root.root.path("/fleet.db");
   appendInPortions(path, records(8));
   std::filesystem::permissions(root.root.path("/"), std::filesystem::perms(0755));
+  for (const char* end : {"", "-wal", "-shm"})
+    std::filesystem::permissions(path + end, std::filesystem::perms(0644));
   const auto failureOfAnother = [&] {
     EXPECT_EQ(seteuid(65534), 0);
     const std::string failure =

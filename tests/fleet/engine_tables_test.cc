@@ -43,6 +43,8 @@ TEST(EngineTables, AnswerTheSameStatementsOnBothEngines) {
   const ClickhouseServer server;
   for (const std::string& where : {path, server.address("d")})
     openEngine(where, OpenMode::kWrite)->append(records(600));
+  for (const char* end : {"", "-wal", "-shm"})
+    EXPECT_EQ(std::filesystem::status(path + end).permissions(), std::filesystem::perms{0640});
   sqlite3* connection = nullptr;
   sqlite3_open_v2(path.c_str(), &connection, SQLITE_OPEN_READONLY, nullptr);
   const auto addRow = [](void* answer, int columns, char** values, char**) {

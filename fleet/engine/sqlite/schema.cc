@@ -1,12 +1,14 @@
 #include "fleet/engine/sqlite/schema.h"
 
 #include <cstdint>
+#include <fcntl.h>
 #include <string_view>
 
 #include "base/bytes.h"
 #include "fleet/engine/engine.h"
 #include "fleet/engine/regular_file.h"
 #include "fleet/engine/sqlite/row_id.h"
+#include "platform/linux/files/descriptor.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -114,7 +116,13 @@ void createTables(Connection& connection) {
 
 Connection openFile(const std::string& path, bool writes) {
   const std::string nothing = path + ": there is no database: load logs into it first";
-  if (look(path) == Found::kNothing && !writes) throw EngineError(nothing);
+  if (look(path) == Found::kNothing) {
+    if (!writes) throw EngineError(nothing);
+    // An empty file is a new database to SQLite. The files beside it get its mode. When it cannot
+    // be made, SQLite says why.
+    constexpr mode_t kMode = 0640;
+    const Descriptor made(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC, kMode));
+  }
   Connection connection(path, writes);
   // A program that was killed while it made the tables left a file with a header; SQLite rolls such
   // a file back to an empty one when it opens it.
