@@ -40,8 +40,11 @@ CsvWriter& CsvWriter::title(std::string_view value) {
 CsvWriter& CsvWriter::text(std::string_view value) {
   constexpr std::string_view kFormulas = "=+-@\t\r";
   std::string safe;
-  if (!value.empty() && kFormulas.find(value.front()) != std::string_view::npos) safe = "'";
+  bool beginsCell = true;
   while (!value.empty()) {
+    if (beginsCell && kFormulas.find(value.front()) != std::string_view::npos) safe += '\'';
+    // Spreadsheets of some languages separate cells by semicolons.
+    beginsCell = value.front() == ';';
     const char32_t codePoint = takeCodePoint(value);
     appendCodePoint(safe, isControl(codePoint) ? kReplacementCharacter : codePoint);
   }

@@ -287,8 +287,8 @@ TEST(ShowOutputTest, KeepsTheEndsOfBucketsApart) {
 
 TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
   std::ostringstream out;
-  CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F");
-  EXPECT_EQ(out.str(), "\uFFFD\uFFFD[m\uFFFD\tü,'=\uFFFD");
+  CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F").text(";=1;a;;-");
+  EXPECT_EQ(out.str(), "\uFFFD\uFFFD[m\uFFFD\tü,'=\uFFFD,;'=1;a;;'-");
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
