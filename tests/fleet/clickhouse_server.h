@@ -29,6 +29,7 @@ class ClickhouseServer {
                    "tmp/</tmp_path><users_config>users.xml</users_config>"
                    "<default_profile>default</default_profile>"
                    "<default_database>default</default_database>"
+                   "<timezone>Pacific/Kiritimati</timezone>"
                    "<mark_cache_size>16777216</mark_cache_size><remote_servers><pair>" +
                    shards + "</pair></remote_servers></yandex>");
     root.write("/users.xml",

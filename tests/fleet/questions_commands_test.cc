@@ -17,6 +17,7 @@ namespace tavrel::fleet {
 namespace {
 
 using testing::HasSubstr;
+using testing::StartsWith;
 
 struct Output {
   int status;
@@ -112,9 +113,22 @@ TEST_F(QuestionCommands, AnswerInTheSameBitsOnBothEnginesInAnyOrder) {
 // Fills in the variables as Grafana's data source does.
 TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
   ClickhouseServer server;
-  load(server.address("fleet"), 1);
+  std::vector<LogRecord> all = records();
+  for (std::size_t i = 0; i < all.size(); ++i) {
+    const bool isFinite = i % 4 != 0;
+    all[i].distributions[0].numbers.mean = isFinite ? 100 : std::numeric_limits<double>::infinity();
+    all[i].distributions.push_back({"plain", {1, 1, 1, 0, 1}});
+    all[i].scalars.push_back({"com.norvane.ioreport.nvme1.used_pct", 20});
+    for (const char* const key : {"a'b", "a\\", "a\n"})
+      all[i].scalars.push_back({key, 1});
+  }
+  openEngine(server.address("fleet"), OpenMode::kWrite)->append(all);
   const auto dashboard =
       nlohmann::json::parse(contentOf(std::string(TAVREL_EXAMPLES) + "/fleet/grafana.json"));
+  const auto& lists = dashboard["templating"]["list"];
+  EXPECT_EQ(server.ask(lists[2]["query"], "fleet"),
+            "almost\ncom.norvane.ioreport.nvme0.used_pct\ncom.norvane.ioreport.nvme1.used_pct\n");
+  EXPECT_EQ(server.ask(lists[3]["query"], "fleet"), "plain\n");
   std::vector<std::string> answers;
   for (const auto& panel : dashboard["panels"]) {
     std::string sql = panel["targets"][0]["rawSql"];
@@ -126,13 +140,17 @@ TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
       for (std::size_t at = sql.find(variable); at != std::string::npos; at = sql.find(variable))
         sql.replace(at, std::strlen(variable), value);
     }
+    if (panel["type"] == "timeseries") sql = "SELECT toUInt32(time), * FROM (" + sql + ")";
     answers.push_back(server.ask(sql, "fleet"));
   }
-  EXPECT_EQ(answers[0].substr(0, answers[0].find('\n')), "2026-11-23 00:00:00\tOS 4.10 (B)\t20");
+  const std::string day = std::to_string(20780 * 86'400) + "\t2026-11-23 00:00:00\tOS ";
+  EXPECT_THAT(answers[0], StartsWith(day + "4.10 (B)\t20\n" + day + "4.9 (A)\t20\n"));
+  EXPECT_THAT(answers[2], StartsWith(day + "4.10 (B)\t"));
+  EXPECT_THAT(answers[4], StartsWith(day + "4.10 (B)\t100\n" + day + "4.9 (A)\t100\n"));
   EXPECT_EQ(answers[1], "\t13\n(other)\t13\nAT\t11\n");
   EXPECT_THAT(answers[3], HasSubstr("OS 4.9 (A)\t20\t1152921504606846976\t"));
   EXPECT_EQ(answers[5], "(-inf, 100]\t320\n(100, inf)\t240\n");
-  EXPECT_EQ(answers[6], "OS 4.10 (B)\t20\t20\t38\nOS 4.9 (A)\t20\t21\t39\n");
+  EXPECT_EQ(answers[6], "OS 4.10 (B)\t20\t20\t36\nOS 4.9 (A)\t20\t20\t37\n");
 }
 
 TEST_F(QuestionCommands, TellWhatChanged) {
