@@ -54,10 +54,12 @@ std::string percentileText(const ShownSet& set, std::size_t index, std::string_v
   if (index >= set.histogram.percentiles.size()) return "";
   const Interval& interval = set.histogram.percentiles[index];
   const auto shortText = [unit](double end) { return cellText(end, unit); };
-  // Ends that shortening makes alike are written in full, in the unit above the table.
-  return shortText(interval.lower) == shortText(interval.upper)
-             ? intervalText(interval, page::exactNumber)
-             : intervalText(interval, shortText);
+  const std::string lower = shortText(interval.lower);
+  if (lower != shortText(interval.upper)) return intervalText(interval, shortText);
+  // Ends that shortening makes alike are written in full.
+  std::string text = intervalText(interval, page::exactNumber);
+  const bool isInUnitAbove = lower == page::shortNumber(interval.lower);
+  return isInUnitAbove ? text : text.append(" ").append(unit);
 }
 
 std::string meanText(const ShownSet& set, std::string_view unit) {

@@ -199,19 +199,21 @@ TEST_F(QuestionCommands, TellWhatChanged) {
 }
 
 TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
+  constexpr const char* kKey = "com.norvane.usage.cpu.busy_milliseconds";
   std::vector<LogRecord> all;
   for (std::uint64_t device = 0; device < 20; ++device) {
     LogRecord& record = all.emplace_back(makeRecord(device, 20779));
     record.osVersion = kOld;
-    record.distributions = {{"near", {1000.3, 1000.5, 1000.4, 0.02, 2}}};
-    record.cells = {{"near", 1000.2, 1000.4, "(1000.2, 1000.4]", 1},
-                    {"near", 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
+    record.distributions = {{kKey, {1000.3, 1000.5, 1000.4, 0.02, 2}}};
+    record.cells = {{kKey, 1000.2, 1000.4, "(1000.2, 1000.4]", 1},
+                    {kKey, 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
   }
   openEngine(file, OpenMode::kWrite)->append(all);
   const std::string page = run(file, {"page", "-o", "-"}).out;
   for (const char* bar : {"\"1000.2 to 1000.4: 20\"", "\"1000.4 to 1000.6: 20\""})
     EXPECT_THAT(page, HasSubstr(std::string("aria-label=") + bar));
-  EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4</td>"));
+  EXPECT_THAT(page, HasSubstr("data-title=\"Mean\">1 s</td>"));
+  EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4 milliseconds</td>"));
 }
 
 TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
