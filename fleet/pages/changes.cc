@@ -13,6 +13,7 @@ namespace tavrel::fleet {
 namespace {
 
 constexpr std::size_t kMostSentences = 8;
+constexpr std::size_t kMostChanges = 100;
 
 /// In percent, with one decimal.
 double percentOf(double share) {
@@ -207,7 +208,7 @@ void writeInShort(page::HtmlWriter& html, const FleetPage& page) {
     html.end();
   }
   if (changes > kMostSentences) {
-    html.element("li", "and " + countText(changes - kMostSentences) + " more, listed below.");
+    html.element("li", "and " + countText(changes - kMostSentences) + " more: see below.");
   }
   if (changes != 0) html.end();
   writeWear(html, page.wear);
@@ -225,9 +226,19 @@ void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison) {
       ". The dots are the changes of the means in percent, the lines their 95 % confidence "
       "intervals.");
   html.end();
-  writeChart(html, comparison);
-  writeTable(html, comparison);
-  writeLeftOut(html, comparison);
+  // Changes come first, the largest before the others.
+  const std::size_t changes = changesOf(comparison);
+  const std::size_t further = changes - std::min(changes, kMostChanges);
+  CompareAnswer shown = comparison;
+  const auto end = shown.comparisons.begin() + static_cast<std::ptrdiff_t>(changes);
+  shown.comparisons.erase(end - static_cast<std::ptrdiff_t>(further), end);
+  writeChart(html, shown);
+  writeTable(html, shown);
+  if (further != 0) {
+    html.element("p", "tavrel-fleet compare lists " + counted(further, "more change") + ".",
+                 {{"class", "note"}});
+  }
+  writeLeftOut(html, shown);
 }
 
 }  // namespace tavrel::fleet

@@ -48,7 +48,7 @@ FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
   // The largest changes come first, then distributions, then scalars.
   std::vector<Key> others;
   const auto add = [&](const Key& key) {
-    if (tellsOfWear(key)) {
+    if (tellsOfWear(key) && page.wear.size() < kMostStatistics) {
       page.wear.push_back(askAbout(engine, ledger, key, days));
     } else {
       others.push_back(key);
@@ -94,17 +94,11 @@ std::string textOf(const FleetPage& page) {
   writeInShort(document.section("In short"), page);
   if (page.comparison)
     writeChanges(document.section("What the newest version changed"), *page.comparison);
-  if (!page.wear.empty()) writeStatistics(document.section("Wear of the flash"), page.wear);
+  if (!page.wear.empty()) writeStatistics(document.section("Wear of the flash"), page.wear, 0);
   writeFleet(document.section("The fleet"), summary);
   if (!page.statistics.empty()) {
-    page::HtmlWriter& html = document.section("Statistics by version");
-    writeStatistics(html, page.statistics);
-    if (page.furtherStatistics != 0) {
-      html.element(
-          "p",
-          "tavrel-fleet show prints " + counted(page.furtherStatistics, "more statistic") + ".",
-          {{"class", "note"}});
-    }
+    writeStatistics(document.section("Statistics by version"), page.statistics,
+                    page.furtherStatistics);
   }
   page::HtmlWriter& html = document.section("How to read this page");
   html.element(

@@ -13,7 +13,9 @@ namespace tavrel::fleet {
 void writeInShort(page::HtmlWriter& html, const FleetPage& page);
 void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary);
 void writeChanges(page::HtmlWriter& html, const CompareAnswer& comparison);
-void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers);
+/// Says that there are `further` statistics, and those for which the section has no room.
+void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers,
+                     std::size_t further);
 
 /// The short meaning of a key when it is known, else the key itself.
 std::string nameOf(std::string_view key);

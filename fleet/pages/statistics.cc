@@ -1,5 +1,6 @@
 // The parts of the fleet, and its statistics by version.
 #include <cmath>
+#include <span>
 
 #include "base/civil_time.h"
 #include "catalogue/catalogue.h"
@@ -12,6 +13,10 @@
 namespace tavrel::fleet {
 
 namespace {
+
+/// Nobody would read more.
+constexpr std::size_t kMostBars = 1'000;              // of one statistic
+constexpr std::size_t kMostSectionBytes = 1'000'000;  // when a statistic begins
 
 void writeGroups(page::HtmlWriter& html, const char* title, const SummaryPart& part,
                  std::size_t devicesAtLeast) {
@@ -158,12 +163,17 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
   }
 }
 
-void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers) {
+void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answers,
+                     std::size_t further) {
   std::size_t hidden = 0;
   for (const ShowAnswer& answer : answers) {
     const ShowSide& side = answer.sides.front();
     if (!side.isShown) {
       ++hidden;
+      continue;
+    }
+    if (html.written().size() >= kMostSectionBytes) {
+      ++further;
       continue;
     }
     const std::string name = nameOf(answer.request.key);
@@ -187,14 +197,28 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
           "p", "The mean is without " + withoutMeanText(withoutMean, answer.devicesAtLeast) + ".",
           {{"class", "note"}});
     }
+    const std::span sets = side.groups.empty() ? std::span(&side.whole, 1) : std::span(side.groups);
+    std::size_t buckets = 0;
+    for (const ShownSet& set : sets)
+      buckets += set.histogram.pieces.size();
+    if (buckets > kMostBars) {
+      html.element("p",
+                   "tavrel-fleet show --buckets prints the histograms, which have " +
+                       countText(buckets) + " buckets.",
+                   {{"class", "note"}});
+      continue;
+    }
     html.begin("div", {{"class", "cards"}});
-    if (side.groups.empty()) writeHistogramOf(html, side.whole, name);
-    for (const ShownSet& group : side.groups)
-      writeHistogramOf(html, group, name);
+    for (const ShownSet& set : sets)
+      writeHistogramOf(html, set, name);
     html.end();
   }
   if (hidden != 0) {
     html.element("p", "Not shown: " + counted(hidden, "statistic") + " of too few devices.",
+                 {{"class", "note"}});
+  }
+  if (further != 0) {
+    html.element("p", "tavrel-fleet show prints " + counted(further, "more statistic") + ".",
                  {{"class", "note"}});
   }
 }

@@ -216,6 +216,37 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
   EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4 milliseconds</td>"));
 }
 
+TEST_F(QuestionCommands, PagesAreBounded) {
+  std::vector<LogRecord> all;
+  for (std::int64_t device = 0; device < 20; ++device) {
+    LogRecord& record = all.emplace_back(makeRecord(static_cast<std::uint64_t>(device), 20779));
+    const bool isNew = device % 2 == 0;
+    record.osVersion = isNew ? kNew : kOld;
+    for (int i = 0; i < 101; ++i) {
+      const std::string key = std::to_string(i) + ".used_pct";
+      record.scalars.push_back({record.texts.keep(key), device + (isNew ? 100 : 0)});
+    }
+    for (int i = 0; i < 10; ++i) {
+      const std::string_view key = record.texts.keep("fine " + std::to_string(i));
+      const int buckets = i == 0 ? 501 : 499;
+      record.distributions.push_back({key, {1, 501, isNew ? 260.0 : 250.0, 1e6, 501}});
+      for (int lower = 0; lower < buckets; ++lower)
+        record.cells.push_back(
+            {key, lower + 0.0, lower + 1.0, record.texts.keep(std::to_string(lower)), 1});
+    }
+  }
+  openEngine(file, OpenMode::kWrite)->append(all);
+  const std::string page = run(file, {"page", "-o", "-"}).out;
+  for (const char* text :
+       {">tavrel-fleet compare lists 11 more changes.<",
+        ">tavrel-fleet show --buckets prints the histograms, which have 1,002 buckets.<",
+        " more statistics.<"})
+    EXPECT_THAT(page, HasSubstr(text));
+  EXPECT_LT(page.size(), 2'000'000U);
+  const std::regex change("data-title=\"Standard deviations\"");
+  EXPECT_EQ(std::distance(std::sregex_iterator(page.begin(), page.end(), change), {}), 100);
+}
+
 TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   load(file, 1);
   const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 64).out;
