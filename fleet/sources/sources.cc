@@ -95,6 +95,8 @@ class Visit {
     for (const Entry& entry : entries) {
       const std::string inner = path.ends_with('/') ? path + entry.name : path + '/' + entry.name;
       if (entry.type == FileType::kFolder) {
+        // The file system's own, which only root may list.
+        if (entry.name == "lost+found") continue;
         subfolder(opened.get(), entry.name, inner, depth);
       } else if (isArchiveName(entry.name)) {
         if (isRegular(entry, inner)) visitArchive(inner, lines_, sink_);

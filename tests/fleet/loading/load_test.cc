@@ -142,6 +142,7 @@ TEST_F(LoadTest, TakesAServersUploads) {
   write("srv/device-8/" + name + ".gz", gzipped(sampleLog(8)));
   write("srv/device-9/" + name + ".gz", gzipped(sampleLog(9)));
   write("srv/device-9/report-20261127T180218Z-5f0c9a1e.log.gz", gzipped("of another kind"));
+  write("srv/lost+found/#12.log", "nonsense");
   write("srv/.unfinished/0000000001", "half");
   const auto line = [&](const char* device, const char* status, const char* os,
                         const char* options) {
