@@ -68,16 +68,6 @@ struct Entry {
   FileType type;
 };
 
-/// The name of the folder with the file, which for uploads is the device's. A path such as
-/// "./a.log" leaves it out.
-std::string holderOf(const std::string& path) {
-  const std::string_view name = folderNameOf(path);
-  if (!name.empty() && name != "." && name != "..") return std::string(name);
-  std::error_code unknown;
-  const auto folder = std::filesystem::absolute(path, unknown).parent_path();
-  return std::filesystem::canonical(folder, unknown).filename();
-}
-
 class Visit {
  public:
   Visit(const UploadLines& lines, const SourceSink& sink, const std::optional<std::string>& leftOut)
@@ -114,7 +104,7 @@ class Visit {
     item.name = item.path = path;
     item.hasSidecar = hasSidecar;
     const std::string_view name = withoutGzip(fileNameOf(path));
-    const LogMetadata* const line = lines_.find(holderOf(path), name);
+    const LogMetadata* const line = lineOf(path, name);
     if (line != nullptr && !hasSidecar) item.metadata = *line;
     // With a sidecar, the thread that reads it decides.
     if (!hasSidecar && isOtherLog(name, line)) item.kind = Kind::kOther;
@@ -122,6 +112,16 @@ class Visit {
   }
 
  private:
+  /// A device's logs are in a folder of its name. The path may leave that out, as "./a.log" does,
+  /// or lead there through a link.
+  const LogMetadata* lineOf(const std::string& path, std::string_view log) const {
+    const LogMetadata* const line = lines_.find(folderNameOf(path), log);
+    if (line != nullptr || lines_.empty()) return line;
+    std::error_code unknown;
+    const auto folder = std::filesystem::absolute(path, unknown).parent_path();
+    return lines_.find(std::filesystem::canonical(folder, unknown).filename().native(), log);
+  }
+
   bool isRegular(const Entry& entry, const std::string& path) {
     if (entry.type == FileType::kRegular) return true;
     give(sink_, Kind::kSkipped, path,

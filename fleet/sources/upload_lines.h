@@ -19,6 +19,8 @@ class UploadLines {
   /// replaces an earlier one. Returns how many lines do not describe a log that has arrived.
   Expected<std::size_t> read(const std::string& path);
 
+  bool empty() const { return logs_.empty(); }
+
   /// Null when no line describes the log, whose name must end with ".log".
   const LogMetadata* find(std::string_view device, std::string_view log) const;
 

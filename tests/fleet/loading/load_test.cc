@@ -163,6 +163,9 @@ TEST_F(LoadTest, TakesAServersUploads) {
   EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind; 1 without metadata\n");
   EXPECT_EQ(versions(),
             (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||"}));
+  std::filesystem::create_directory_symlink("srv/device-7", at("current"));
+  EXPECT_EQ(run({at("current"), "--metadata", at("lines.log")}).out,
+            "0 loaded, 1 known, 0 refused\n");
   const std::filesystem::path before = std::filesystem::current_path();
   std::filesystem::current_path(at("srv/device-7"));
   for (const std::string& path : {std::string("."), std::string("./"), name + ".gz"})
