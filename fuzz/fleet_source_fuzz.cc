@@ -56,6 +56,7 @@ void read(const fuzz::Tree& tree, const std::string& name, const UploadLines& li
       case SourceItem::Kind::kSkipped:
         return require(!item.record && !item.source.reason.empty());
       case SourceItem::Kind::kOther:
+      case SourceItem::Kind::kTooNew:
         return require(!item.record);
       default:
         require(item.record && item.bytes <= fleet::limits::kLogBytes);

@@ -47,11 +47,13 @@ void printCounts(FleetContext& context, const LoadCounts& counts) {
                               {"known", counts.known},
                               {"refused", counts.refused},
                               {"others", counts.others},
+                              {"left_to_next_load", counts.tooNew},
                               {"without_metadata", counts.withoutMetadata}});
   }
   context.out() << format("%zu loaded, %zu known, %zu refused", counts.loaded, counts.known,
                           counts.refused);
   if (counts.others != 0) context.out() << format("; %zu of another kind", counts.others);
+  if (counts.tooNew != 0) context.out() << format("; %zu left to the next load", counts.tooNew);
   if (counts.withoutMetadata != 0)
     context.out() << format("; %zu without metadata", counts.withoutMetadata);
   context.out() << '\n';

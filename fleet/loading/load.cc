@@ -47,6 +47,10 @@ class Loading {
       ++counts_.others;
       return Done{};
     }
+    if (item.source.kind == SourceItem::Kind::kTooNew) {
+      ++counts_.tooNew;
+      return Done{};
+    }
     const bool isRefused = item.source.kind == SourceItem::Kind::kRefused;
     listener_.note(format("%s: %s: %s", isRefused ? "refused" : "skipped", item.source.name,
                           item.source.reason));

@@ -17,6 +17,7 @@ struct SourceItem {
     kRefused,  ///< a log that cannot be obtained
     kSkipped,  ///< something that cannot be a log, such as a link
     kOther,    ///< a log of another kind
+    kTooNew,   ///< a log whose metadata may still follow
   };
   Kind kind = Kind::kFile;
   std::string name;     // for people: a path, or "ARCHIVE: MEMBER"

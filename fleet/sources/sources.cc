@@ -107,7 +107,11 @@ class Visit {
     const LogMetadata* const line = lineOf(path, name);
     if (line != nullptr && !hasSidecar) item.metadata = *line;
     // With a sidecar, the thread that reads it decides.
-    if (!hasSidecar && isOtherLog(name, line)) item.kind = Kind::kOther;
+    if (!hasSidecar && isOtherLog(name, line)) {
+      item.kind = Kind::kOther;
+    } else if (!hasSidecar && line == nullptr && mayLineFollow(path)) {
+      item.kind = Kind::kTooNew;
+    }
     sink_(std::move(item));
   }
 
@@ -120,6 +124,11 @@ class Visit {
     std::error_code unknown;
     const auto folder = std::filesystem::absolute(path, unknown).parent_path();
     return lines_.find(std::filesystem::canonical(folder, unknown).filename().native(), log);
+  }
+
+  bool mayLineFollow(const std::string& path) const {
+    struct stat status {};
+    return stat(path.c_str(), &status) == 0 && lines_.mayFollow(status.st_mtime);
   }
 
   bool isRegular(const Entry& entry, const std::string& path) {

@@ -46,6 +46,7 @@ bool UploadLines::add(std::string_view line) {
 }
 
 Expected<std::size_t> UploadLines::read(const std::string& path) {
+  if (!asked_) asked_ = std::time(nullptr);
   // Longer than any line of a server that bounds its headers.
   constexpr std::size_t kLineBytes = 64U << 10;
   const std::unique_ptr<gzFile_s, Close> file(gzopen(path.c_str(), "rbe"));
@@ -71,6 +72,13 @@ Expected<std::size_t> UploadLines::read(const std::string& path) {
 const LogMetadata* UploadLines::find(std::string_view device, std::string_view log) const {
   const auto found = logs_.find(keyOf(device, log));
   return found == logs_.end() ? nullptr : &found->second;
+}
+
+bool UploadLines::mayFollow(std::time_t written) const {
+  constexpr std::time_t kSlackSeconds = 60;
+  // A time in the future is that of a clock that was wrong, and tells nothing.
+  return asked_ && written >= *asked_ - kSlackSeconds &&
+         written <= std::time(nullptr) + kSlackSeconds;
 }
 
 }  // namespace tavrel::fleet

@@ -3,6 +3,8 @@
 #pragma once
 
 #include <cstddef>
+#include <ctime>
+#include <optional>
 #include <string>
 #include <string_view>
 #include <unordered_map>
@@ -24,8 +26,14 @@ class UploadLines {
   /// Null when no line describes the log, whose name must end with ".log".
   const LogMetadata* find(std::string_view device, std::string_view log) const;
 
+  /// Whether the line of a log that was written at this time may follow in a file that has been
+  /// read. The server writes it once the log is in its place.
+  bool mayFollow(std::time_t written) const;
+
  private:
   bool add(std::string_view line);
+
+  std::optional<std::time_t> asked_;  // when the first file was read
 
   std::unordered_map<std::string, LogMetadata, KeyedHash> logs_;  // by "DEVICE/LOG"
 };

@@ -1,3 +1,4 @@
+#include <chrono>
 #include <csignal>
 #include <gtest/gtest.h>
 #include <set>
@@ -16,6 +17,8 @@
 
 namespace tavrel::fleet {
 namespace {
+
+using namespace std::chrono_literals;
 
 constexpr const char* kMetadata =
     "<plist version=\"1.0\"><dict><key>LogType</key><string>193</string><key>OSVersion</key>"
@@ -123,7 +126,7 @@ TEST_F(LoadTest, TakesAnOutbox) {
   write("again/b.plist", sampleLog(2));
   EXPECT_EQ(run({at("again"), at("outbox"), "--json"}).out,
             "{\n  \"format_version\": 1,\n  \"loaded\": 0,\n  \"known\": 4,\n  \"refused\": 0,\n"
-            "  \"others\": 2,\n  \"without_metadata\": 3\n}\n");
+            "  \"others\": 2,\n  \"left_to_next_load\": 0,\n  \"without_metadata\": 3\n}\n");
 }
 
 TEST_F(LoadTest, TakesMetadataOnlyFromBesideTheLog) {
@@ -142,6 +145,7 @@ TEST_F(LoadTest, TakesAServersUploads) {
   write("srv/device-8/" + name + ".gz", gzipped(sampleLog(8)));
   write("srv/device-9/" + name + ".gz", gzipped(sampleLog(9)));
   write("srv/device-9/report-20261127T180218Z-5f0c9a1e.log.gz", gzipped("of another kind"));
+  write("srv/lost/" + name + ".gz", gzipped(sampleLog(10)));
   write("srv/lost+found/#12.log", "nonsense");
   write("srv/.unfinished/0000000001", "half");
   const auto line = [&](const char* device, const char* status, const char* os,
@@ -156,13 +160,20 @@ TEST_F(LoadTest, TakesAServersUploads) {
                           "previous_os_version=4.1%26%3D&ConfigNumber=%43") +
                          line("device-8", "201", "Pellio 5", "previous_os_version=<unknown>") +
                          "{\"half\":\n" + line("device-9", "413", "Pellio 6", ""));
-  const Outcome outcome =
-      run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
+  const auto load = [&] {
+    return run({at("srv"), "--metadata", at("old.log.gz"), "--metadata", at("lines.log")});
+  };
+  const Outcome outcome = load();
   EXPECT_EQ(outcome.error,
             "tavrel-fleet: lines.log: 2 lines ignored: they report no successful upload\n");
-  EXPECT_EQ(outcome.out, "3 loaded, 0 known, 0 refused; 1 of another kind; 1 without metadata\n");
+  EXPECT_EQ(outcome.out,
+            "2 loaded, 0 known, 0 refused; 1 of another kind; 2 left to the next load\n");
+  const auto now = std::filesystem::file_time_type::clock::now();
+  std::filesystem::last_write_time(at("srv/device-9/" + name + ".gz"), now - 90s);
+  std::filesystem::last_write_time(at("srv/lost/" + name + ".gz"), now + 1h);
+  EXPECT_EQ(load().out, "2 loaded, 2 known, 0 refused; 1 of another kind; 2 without metadata\n");
   EXPECT_EQ(versions(),
-            (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||"}));
+            (std::multiset<std::string>{"7|Pellío 4.2|4.1&=|C", "8|Pellio 5||", "9|||", "10|||"}));
   std::filesystem::create_directory_symlink("srv/device-7", at("current"));
   EXPECT_EQ(run({at("current"), "--metadata", at("lines.log")}).out,
             "0 loaded, 1 known, 0 refused\n");
