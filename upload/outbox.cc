@@ -1,12 +1,8 @@
 #include "upload/outbox.h"
 
 #include <algorithm>
-#include <fcntl.h>
-#include <sys/stat.h>
-#include <unistd.h>
 
 #include "base/limits.h"
-#include "platform/linux/files/descriptor.h"
 
 namespace tavrel::upload {
 namespace {
@@ -19,19 +15,6 @@ std::vector<WaitingLog> oldestFirst(const LogFolder& folder, const LogFolder::Li
   return logs;
 }
 
-constexpr mode_t kClosed = 0700;
-constexpr mode_t kOpen = 0755;
-
-void openIfClosed(const std::string& folder) {
-  const Descriptor descriptor(
-      ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-  struct stat found {};
-  if (descriptor && fstat(descriptor.get(), &found) == 0 && found.st_uid == geteuid() &&
-      (found.st_mode & ALLPERMS) == kClosed) {
-    fchmod(descriptor.get(), kOpen);
-  }
-}
-
 }  // namespace
 
 Outbox::Outbox(const DeviceRoot& root, FileSystem& files)
@@ -40,11 +23,6 @@ Outbox::Outbox(const DeviceRoot& root, FileSystem& files)
       pending_(folder_, kPendingFolder, files),
       outbox_(folder_, kOutboxFolder, files),
       refused_(folder_, kRefusedFolder, files) {}
-
-void Outbox::openFolders() const {
-  openIfClosed(outbox_.path());
-  openIfClosed(refused_.path());
-}
 
 Expected<std::vector<WaitingLog>> Outbox::logs() {
   auto listing = outbox_.list();

@@ -31,10 +31,6 @@ class Outbox {
   std::string logPath(std::string_view name) const { return outbox_.logPath(name); }
   std::string metadataPath(std::string_view name) const { return outbox_.metadataPath(name); }
 
-  /// Lets users other than root list the logs: opens the folders that an earlier version of the
-  /// program made for its own user alone.
-  void openFolders() const;
-
   /// The logs in the outbox, oldest first. Opens no file. Removes metadata without its log.
   Expected<std::vector<WaitingLog>> logs();
 

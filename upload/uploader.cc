@@ -133,7 +133,6 @@ Outcome Uploader::run(bool atOnce) {
 
 Outcome Uploader::runLocked(bool atOnce) {
   state_ = readUploadState(services_.files, services_.propertyLists, services_.log, statePath_);
-  outbox_.openFolders();
   const Permission permitted = permission();
   if (permitted == Permission::Withdrawn) return removeWaiting();
   if (permitted_.isHeldBack()) {

@@ -370,22 +370,6 @@ TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
   EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().sent), std::tuple(1, 0));
 }
 
-TEST(Upload, OpensTheFoldersThatEarlierVersionsClosed) {
-  const std::tuple<std::string, unsigned, unsigned> cases[] = {{"outbox", 0700, 0755},
-                                                               {"refused", 0700, 0755},
-                                                               {"outbox", 0750, 0750},
-                                                               {"pending", 0700, 0700}};
-  for (const auto& [name, before, after] : cases) {
-    Device device;
-    device.permit("");
-    device.add(nameOf(1), name + "/");
-    const std::string folder = device.root.path(kSubmission + name);
-    fs::permissions(folder, fs::perms{before});
-    EXPECT_EQ(device.run(), Outcome::Done);
-    EXPECT_EQ(fs::status(folder).permissions(), fs::perms{after}) << name;
-  }
-}
-
 TEST(Upload, LosesNoLogThatChangesMeanwhile) {
   Device device;
   for (int number = 1; number < 5; ++number)
