@@ -49,6 +49,8 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "prefs set --help'"},
       {"log show --raw --json",
        "--raw and --json exclude each other: see 'tavrelctl log show --help'"},
+      {CommandLine{"plist", "convert", "--to", "1 excludes 2", "x"},
+       "--to: not xml, binary or json: 1 excludes 2: see 'tavrelctl plist convert --help'"},
       {CommandLine{"log", "preview", "--day", ""},
        "--day: must not be empty: see 'tavrelctl log preview --help'"},
       {"erase --key= --yes", "--key: must not be empty: see 'tavrelctl erase --help'"},

@@ -23,12 +23,13 @@ bool takesMore(const CLI::App& command) {
 }
 
 // CLI11's words for a fault, in the words of the other messages.
-std::string inOurWords(const std::string& fault) {
+std::string inOurWords(const CLI::ParseError& error) {
   constexpr std::string_view kNoSubcommand = "A subcommand is required";
   constexpr std::string_view kTooMany = "Requires at most 1 options be given from [";
   constexpr std::string_view kNoValue = ": 1 required ";
   constexpr std::string_view kMissing = " missing";
   constexpr std::string_view kExcludes = " excludes ";
+  const std::string fault = error.what();
   if (fault == kNoSubcommand) return "name a subcommand";
   if (fault.starts_with(kTooMany) && fault.ends_with(']')) {
     std::vector<std::string> options;
@@ -43,7 +44,9 @@ std::string inOurWords(const std::string& fault) {
     return fault.substr(0, at) +
            " needs a value: " + fault.substr(type, fault.size() - type - kMissing.size());
   }
-  if (const std::size_t at = fault.find(kExcludes); at != std::string::npos) {
+  // Other faults quote what the user typed, which may contain the same words.
+  if (const std::size_t at = fault.find(kExcludes);
+      at != std::string::npos && dynamic_cast<const CLI::ExcludesError*>(&error) != nullptr) {
     return fault.substr(0, at) + " and " + fault.substr(at + kExcludes.size()) +
            " exclude each other";
   }
@@ -59,7 +62,7 @@ std::string usageFault(const CLI::App& app, const std::vector<std::string>& argu
     command = command->get_subcommands().front();
     line += ' ' + command->get_name();
   }
-  std::string fault = inOurWords(error.what());
+  std::string fault = inOurWords(error);
   const auto unknown = app.remaining(true);
   const bool isExtra = dynamic_cast<const CLI::ExtrasError*>(&error) != nullptr;
   const bool isMissing = dynamic_cast<const CLI::RequiredError*>(&error) != nullptr;
