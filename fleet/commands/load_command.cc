@@ -68,9 +68,12 @@ void load(FleetContext& context, const LoadOptions& options) {
             context.note(line);
           },
       .progress = [&](const LoadCounts& counts) { progress.show(counts); }};
-  for (const std::string& path : options.request.paths) {
-    if (struct stat status{}; stat(path.c_str(), &status) != 0)
-      return context.fail(systemError("read", path).message + ": check the path");
+  for (const auto* named :
+       {&options.request.paths, &options.request.uploadLines, &options.request.whitelists}) {
+    for (const std::string& path : *named) {
+      if (struct stat status{}; stat(path.c_str(), &status) != 0)
+        return context.fail(systemError("read", path).message + ": check the path");
+    }
   }
   const auto engine = context.openDatabase(OpenMode::kWrite);
   LoadRequest request = options.request;

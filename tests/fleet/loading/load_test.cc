@@ -276,11 +276,15 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
 
 TEST_F(LoadTest, LoadsNothingWhenAPathIsWrong) {
   write("in/good.log", sampleLog(1));
-  const Outcome outcome = run({at("in"), at("none.log"), "--set-aside", at("aside")});
-  EXPECT_EQ(outcome.error,
-            "tavrel-fleet: cannot read none.log: No such file or directory: check the path\n");
-  EXPECT_EQ(outcome.out, "");
-  EXPECT_EQ(outcome.status, 1);
+  for (const char* option : {"--whitelist", "--metadata", ""}) {
+    std::vector<std::string> arguments = {at("in"), at("none.log"), "--set-aside", at("aside")};
+    if (*option != '\0') arguments.insert(arguments.begin() + 1, option);
+    const Outcome outcome = run(arguments);
+    EXPECT_EQ(outcome.error,
+              "tavrel-fleet: cannot read none.log: No such file or directory: check the path\n");
+    EXPECT_EQ(outcome.out, "");
+    EXPECT_EQ(outcome.status, 1);
+  }
   EXPECT_FALSE(std::filesystem::exists(at("fleet.db")));
   EXPECT_FALSE(std::filesystem::exists(at("aside")));
 }
@@ -315,8 +319,8 @@ TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
       "tavrel-fleet: refused: in/3.log: its whitelist \"eb42570d2e2f7addc42403d203dafde4\" is "
       "not among those given\n");
   EXPECT_EQ(outcome.out, "1 loaded, 0 known, 2 refused; 1 without metadata\n");
-  EXPECT_EQ(run({at("in"), "--whitelist", at("none.plist")}).error,
-            "tavrel-fleet: whitelist none.plist: cannot be read: No such file or directory\n");
+  EXPECT_EQ(run({at("in"), "--whitelist", at("in")}).error,
+            "tavrel-fleet: whitelist in: is not a regular file\n");
 }
 
 TEST_F(LoadTest, LosesNothingAndCountsNothingTwiceWhenKilled) {
