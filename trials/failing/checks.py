@@ -2,6 +2,7 @@
 
 import contextlib
 import functools
+import json
 import plistlib
 import re
 import sqlite3
@@ -237,7 +238,7 @@ def collected(root):
 
 
 def is_allowed(root):
-    return '"allowed": true' in tool(root, "status", "--json")
+    return json.loads(tool(root, "status", "--json"))["submission_allowed"]
 
 
 @functools.cache
