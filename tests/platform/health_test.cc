@@ -289,9 +289,19 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
   write("/sys/class/ubi/ubi0/mtd_num", "7\n");
   write("/sys/class/ubi/ubi1/mtd_num",
         "a text as long as labels may be, which is 64 bytes and no more..");
+  const std::string host = "/sys/devices/ufs/host/";
+  write("/sys/devices/ufs/health_descriptor/life_time_estimation_a", "0x03\n");
+  for (const std::string unit : {"sdb", "sdc"}) {
+    write(host + unit + "/vendor", "MAKER\n");
+    std::filesystem::create_directories(root.path("/sys/block/" + unit));
+    std::filesystem::create_directory_symlink(root.path(host + unit),
+                                              root.path("/sys/block/" + unit + "/device"));
+  }
+  write("/sys/block/sda/device/vendor", "ATA\n");  // asleep: `answers` has no data of it
   ASSERT_TRUE(readAll(1000));
   auto all = readings();
-  ASSERT_EQ(all.size(), 5U);
+  ASSERT_EQ(all.size(), 6U);
+  EXPECT_EQ(valuesOf(all["ufs0"].figures), (Values{{"life_a_pct", 30}}));
   EXPECT_EQ(all["ubi0"].model, "mtd7");
   EXPECT_EQ(all["ubi1"].model, "mtd");
   EXPECT_EQ(all["nvme0"].capacity, 2048 * 512);

@@ -105,6 +105,7 @@ TEST_F(StoreTest, ValuesOutlastALock) {
 }
 
 TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
+  if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
   set({{"k", kToday, 1}});
   const std::string folder = std::filesystem::path(store_->path()).parent_path();
   const std::string rootFolder = root.path("");
@@ -116,7 +117,7 @@ TEST_F(StoreTest, ReadsWhereNothingCanBeWritten) {
   };
   // A user who owns nothing here.
   const auto asAnother = [&](const std::string& expected, const auto& action) {
-    const auto become = [] { return geteuid() != 0 || setresuid(65534, 65534, 65534) == 0; };
+    const auto become = [] { return setresuid(65534, 65534, 65534) == 0; };
     restricted(become, expected, action);
   };
   const auto readAll = [&] {

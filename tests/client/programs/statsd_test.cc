@@ -223,8 +223,8 @@ TEST_F(Statsd, EndsWhenItsFileIsRemoved) {
     EXPECT_EQ(watch.lookAt(now += std::chrono::seconds(1)).error().message, removed);
   });
   const std::string program = kProgram + " --idle 1 --unix " + (root / "own.sock").string();
-  EXPECT_EQ(outputOf("exec 2>&1; timeout 60 " + program + " & until rm " + folder.string() +
-                         "/*.segment; do :; done 2>/dev/null; wait $!",
+  EXPECT_EQ(outputOf("exec 2>&1; timeout 60 " + program + " & while kill -0 $! && ! rm " +
+                         folder.string() + "/*.segment; do :; done 2>/dev/null; wait $!",
                      1),
             "tavrel-statsd: " + removed + "\n");
   std::filesystem::remove(folder);
