@@ -104,7 +104,7 @@ LogOutcome dailyTasksForDay(Platform& platform, std::int32_t day, const plist::A
                             const StepObserver& onStep) {
   DailyWork work{platform, day, appInfo, onStep};
   beginStep(onStep, "Daily tasks");
-  platform.log->log(LogLevel::Default, "daily tasks for day %d", day);
+  platform.log->log(LogLevel::Default, "%s%d", kTasksBegin, day);
   for (const DailyTask& task : kDailyTasks) {
     beginStep(onStep, task.name);
     runGuarded(platform.log, task.purpose, [&] { task.run(work); });

@@ -1,5 +1,5 @@
 // Names of the persistent preferences, for all code that reads or writes them: the daemon's state,
-// and the settings that others make for it.
+// and the settings that others make for it. Also the log line from which a run is recorded.
 #pragma once
 
 #include <string_view>
@@ -41,5 +41,9 @@ inline constexpr std::string_view kTaskingDomain = "com.norvane.da";
 /// Where another component schedules a tasking.
 inline constexpr std::string_view kScheduleDomain = "com.norvane.Drovelink";
 inline constexpr std::string_view kScheduledTaskingKey = "ScheduledTasking";
+
+/// Begins the line that the daemon logs when it begins a day's tasks; the day follows. The record
+/// of the last run takes the day from it (docs/status.md).
+inline constexpr std::string_view kTasksBegin = "daily tasks for day ";
 
 }  // namespace tavrel

@@ -1,15 +1,11 @@
 #include "platform/linux/runs/run_memory.h"
 
-#include <charconv>
 #include <utility>
 
+#include "base/parse_number.h"
+#include "platform/persisted_state.h"
+
 namespace tavrel {
-namespace {
-
-// The beginning of the line that the daemon logs when it begins a day's tasks.
-constexpr std::string_view kTasksBegin = "daily tasks for day ";
-
-}  // namespace
 
 RunMemory::RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::string_view task)
     : root_(std::move(root)), clock_(clock), log_(log) {
@@ -23,9 +19,7 @@ void RunMemory::write(LogLevel level, std::string_view message) {
     run_.addError(message);
   } else if (level == LogLevel::Default && message.starts_with(kTasksBegin)) {
     message.remove_prefix(kTasksBegin.size());
-    std::int64_t day = 0;
-    const char* const end = message.data() + message.size();
-    if (std::from_chars(message.data(), end, day).ptr == end) begin(day);
+    if (const auto day = parseNumber<std::int64_t>(message)) begin(*day);
   }
 }
 
