@@ -203,12 +203,10 @@ void SqliteHistory::readUnchanged(Read read) {
 
 template <class Read>
 Status SqliteHistory::attempt(Read read) {
-  try {
+  return site_.attempt([&]() -> Status {
     readUnchanged(read);
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 // `read` is given a handler for failures that concern one distribution.

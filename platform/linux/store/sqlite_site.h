@@ -7,7 +7,9 @@
 #include <set>
 #include <string>
 #include <string_view>
+#include <type_traits>
 
+#include "base/expected.h"
 #include "platform/clock.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/store/sqlite_connection.h"
@@ -67,6 +69,16 @@ struct StoreSite {
 
   /// "statistics store PATH: MESSAGE".
   std::string describe(const StoreFailure& failure) const;
+
+  /// The outcome of `operation`, or the description of the failure that it throws.
+  template <class Operation>
+  std::invoke_result_t<Operation> attempt(Operation operation) const {
+    try {
+      return operation();
+    } catch (const StoreFailure& failure) {
+      return Error{describe(failure)};
+    }
+  }
 
   /// One line in the system log, with `consequence` at its end.
   void tell(const StoreFailure& failure, std::string_view consequence = {}) const;

@@ -81,19 +81,12 @@ std::int64_t bytesInUseOf(SqliteConnection& connection) {
 }
 
 Expected<std::vector<std::int32_t>> SqliteTrim::days() {
-  try {
-    return daysIn(connection_);
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
+  return site_.attempt(
+      [&]() -> Expected<std::vector<std::int32_t>> { return daysIn(connection_); });
 }
 
 Expected<std::int64_t> SqliteTrim::bytesInUse() {
-  try {
-    return bytesInUseOf(connection_);
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
+  return site_.attempt([&]() -> Expected<std::int64_t> { return bytesInUseOf(connection_); });
 }
 
 // Runs `step` repeatedly, each time in a transaction, until it returns false. On a full disk,
@@ -227,7 +220,7 @@ bool SqliteTrim::canBeConverted(std::int64_t bytes) {
 }
 
 Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
-  try {
+  return site_.attempt([&]() -> Status {
     const std::int64_t pageBytes = connection_.integer("PRAGMA page_size");
     const auto surplus = [&] {
       return connection_.integer("PRAGMA freelist_count") - freeBytesKept / pageBytes;
@@ -248,10 +241,8 @@ Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
     if (!done) return done;
     // The file itself is shortened only when the log is moved into it.
     connection_.checkpoint(false);
-  } catch (const StoreFailure& failure) {
-    return Error{site_.describe(failure)};
-  }
-  return Done{};
+    return Done{};
+  });
 }
 
 // If readers prevent it, the next step or the daily run moves the log.
