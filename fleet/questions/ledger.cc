@@ -7,6 +7,32 @@
 #include "fleet/questions/crossing.h"
 
 namespace tavrel::fleet {
+namespace {
+
+// Positions of groups in the order in which they are joined: those that may not be shown, then the
+// others, each by devices.
+struct JoinOrder {
+  std::vector<std::size_t> positions;
+  std::size_t forbidden = 0;  // how many may not be shown
+};
+
+JoinOrder joinOrder(const Ledger& ledger, const std::string& subject,
+                    const std::vector<Group>& groups) {
+  JoinOrder order;
+  std::vector<std::pair<bool, std::size_t>> ranks;
+  for (const Group& group : groups) {
+    const bool isAllowed =
+        group.name.kind != PartKind::kOther && ledger.allows(subject, group.logs);
+    if (!isAllowed) ++order.forbidden;
+    order.positions.push_back(ranks.size());
+    ranks.emplace_back(isAllowed, group.logs.devices(ledger.table()));
+  }
+  std::ranges::stable_sort(order.positions, {},
+                           [&](std::size_t position) { return ranks[position]; });
+  return order;
+}
+
+}  // namespace
 
 bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   if (!hasEnough(logs)) return false;
@@ -104,25 +130,7 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   division.isShown = true;
   ledger.noteShown(subject, division.whole);
 
-  struct Part {
-    std::size_t devices;
-    std::size_t position;  // among the groups
-    bool isAllowed;
-  };
-  std::vector<Part> parts;
-  for (std::size_t i = 0; i < groups.size(); ++i) {
-    const LogSet& logs = groups[i].logs;
-    const bool isAllowed = groups[i].name.kind != PartKind::kOther && ledger.allows(subject, logs);
-    parts.push_back({logs.devices(table), i, isAllowed});
-  }
-  std::stable_sort(parts.begin(), parts.end(), [](const Part& a, const Part& b) {
-    return a.isAllowed != b.isAllowed ? b.isAllowed : a.devices < b.devices;
-  });
-
-  std::vector<std::size_t> order;
-  order.reserve(parts.size());
-  for (const Part& part : parts)
-    order.push_back(part.position);
+  const JoinOrder order = joinOrder(ledger, subject, groups);
   std::vector<const LogSet*> sets;
   sets.reserve(groups.size() + 1);
   for (const Group& group : groups)
@@ -140,13 +148,14 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
     other.add(groups[position].logs);
     division.joined += groups[position].values;
   };
-  for (const Part& part : parts)
-    if (!part.isAllowed) join(part.position);
+  std::ranges::for_each(std::span(order.positions).first(order.forbidden), join);
   const auto groupsToJoin = [&]() -> std::vector<std::size_t> {
-    if (joined != 0 && !ledger.allows(subject, other))
-      return {*std::ranges::find(order, false, [&](std::size_t i) { return isJoined[i]; })};
+    if (joined != 0 && !ledger.allows(subject, other)) {
+      return {*std::ranges::find(order.positions, false,
+                                 [&](std::size_t position) { return isJoined[position]; })};
+    }
     for (const Crossing& crossing : crossings) {
-      auto found = crossing.groupsToJoin(isJoined, order);
+      auto found = crossing.groupsToJoin(isJoined, order.positions);
       if (!found.empty()) return found;
     }
     return {};
