@@ -55,12 +55,10 @@ struct SegmentName {
 struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
                                BHClientStatus* status);
 void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segment* segment);
-/* Whether the segment's file, or its folder, has been removed. Not known, and false, in a process
- * that has changed its root folder or mounts. */
-bool bhWasRemoved(const char* folder, struct SegmentName name);
-/* Whether the process could create the file that asks for a fold, in the folder that has its
- * segment. */
-bool bhMayAskForFold(const char* folder, struct SegmentName name);
+/* Removed: the segment's file, or its folder, has been removed; not known in a process that has
+ * changed its root folder or mounts. CannotAsk: the process could not create the file that asks for
+ * a fold, in the folder that has its segment. Recording otherwise. */
+BHClientStatus bhStatusOfFile(const char* folder, struct SegmentName name);
 /* Replaces an inherited mapping with empty memory of the process's own. */
 void bhForgetMapping(struct Segment* segment);
 void bhPostFoldWanted(const char* folder);

@@ -138,11 +138,12 @@ static BHClientStatus currentStatus(void) {
     return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
   }
   const struct SegmentName name = nameOfSegment(state);
-  const bool isNamed = name.thread != 0;
+  const BHClientStatus status =
+      name.thread != 0 ? bhStatusOfFile(process->folder, name) : BHClientStatusRecording;
   /* Threads keep pointers into the segment, so that no other can take its place. */
-  if (isNamed && bhWasRemoved(process->folder, name)) return BHClientStatusRemoved;
+  if (status == BHClientStatusRemoved) return status;
   if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
-  if (isNamed && !bhMayAskForFold(process->folder, name)) return BHClientStatusCannotAsk;
+  if (status == BHClientStatusCannotAsk) return status;
   return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
 }
 

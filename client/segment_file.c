@@ -201,38 +201,29 @@ void bhAbandonSegment(const char* folder, struct SegmentName name, struct Segmen
   closeFile(directory);
 }
 
-bool bhWasRemoved(const char* folder, struct SegmentName name) {
-  if (rootFolder() != name.root) return false;
-  const int directory = openFolder(folder);
-  if (directory < 0) return errno == ENOENT;
-  char file[64];
-  writeName(file, name);
-  struct stat entry;
-  const bool isGone = fstatat(directory, file, &entry, AT_SYMLINK_NOFOLLOW) != 0 && errno == ENOENT;
-  closeFile(directory);
-  return isGone;
-}
-
 /* A lack of memory or descriptors says nothing about the rights of the process. */
 static bool mayLater(int error) {
   const BHClientStatus status = statusOf(error);
   return status != BHClientStatusNoFolder && status != BHClientStatusNotAllowed;
 }
 
-bool bhMayAskForFold(const char* folder, struct SegmentName name) {
-  const int directory = openFolder(folder);
-  if (directory < 0) return mayLater(errno);
+BHClientStatus bhStatusOfFile(const char* folder, struct SegmentName name) {
   char ownFile[64];
   writeName(ownFile, name);
   struct stat entry;
-  bool may = fstatat(directory, ownFile, &entry, AT_SYMLINK_NOFOLLOW) == 0 || mayLater(errno);
-  if (may) {
+  const int directory = openFolder(folder);
+  const bool isThere =
+      directory >= 0 && fstatat(directory, ownFile, &entry, AT_SYMLINK_NOFOLLOW) == 0;
+  int error = isThere ? 0 : errno;
+  const bool isRemoved = error == ENOENT && rootFolder() == name.root;
+  if (directory >= 0 && mayLater(error)) {
     /* An unnamed file needs the same rights. Where the kernel lacks faccessat2(), the C library's
      * faccessat() would judge the real user instead of the effective one. */
     const int file = openFile(directory, ".", O_TMPFILE | O_WRONLY, 0600);
-    may = file >= 0 || mayLater(errno);
+    error = file >= 0 ? 0 : errno;
     if (file >= 0) closeFile(file);
   }
-  closeFile(directory);
-  return may;
+  if (directory >= 0) closeFile(directory);
+  if (isRemoved) return BHClientStatusRemoved;
+  return mayLater(error) ? BHClientStatusRecording : BHClientStatusCannotAsk;
 }
