@@ -299,6 +299,7 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
   }
   write("/sys/block/sda/device/vendor", "ATA\n");  // asleep: `answers` has no data of it
   ASSERT_TRUE(readAll(1000));
+  EXPECT_EQ(log.lines, (Lines{"cannot read the health of ubi1: it reports no health figures"}));
   auto all = readings();
   ASSERT_EQ(all.size(), 6U);
   EXPECT_EQ(valuesOf(all["ufs0"].figures), (Values{{"life_a_pct", 30}}));
@@ -373,7 +374,7 @@ TEST_F(HealthReaderTest, ADriveThatIsBeingReadKeepsNoOtherWaiting) {
   EXPECT_FALSE(readAll(1000));
   EXPECT_EQ(readings().size(), 1U);
   EXPECT_EQ(readings()["nvme1"].time, 1000);
-  EXPECT_EQ(log.lines, (Lines{"no health of nvme0: cannot lock " +
+  EXPECT_EQ(log.lines, (Lines{"cannot read the health of nvme0: cannot lock " +
                               root.path("/run/tavrel/health/.nvme0.lock") +
                               ": another process has it locked; it is reading the drive, which is "
                               "defective if that never ends"}));

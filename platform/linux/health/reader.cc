@@ -98,7 +98,7 @@ Reading readWithoutCommands(const Drive& drive) {
       reading.figures = attributeFigures(drive.folder, ubiKinds());
       break;
   }
-  if (reading.figures.empty()) reading.error = "tells no health";
+  if (reading.figures.empty()) reading.error = "it reports no health figures";
   return reading;
 }
 
@@ -140,7 +140,7 @@ std::optional<Reading> HealthReader::readDrive(const Drive& drive) {
   reading.time = moment_.seconds;
   reading.boot = moment_.boot;
   if (!reading.error.empty()) {
-    log_.log(LogLevel::Default, "no health of %s: %s", drive.name, reading.error);
+    log_.log(LogLevel::Default, "cannot read the health of %s: %s", drive.name, reading.error);
   }
   return reading;
 }
@@ -289,7 +289,8 @@ bool HealthReader::readWithCommands(const Drive& drive) {
   // A process that waits for a drive which never answers cannot even be killed.
   const auto driveLock = files_.lockFile(lockPath('.' + drive.name), kDrivePatience);
   if (!driveLock) {
-    log_.log(LogLevel::Error, "no health of %s: %s", drive.name, driveLock.error().message);
+    log_.log(LogLevel::Error, "cannot read the health of %s: %s", drive.name,
+             driveLock.error().message);
     return false;
   }
   refreshMemory();
