@@ -53,7 +53,7 @@ void readMemory(ByteSpan bytes) {
   for (auto& [identity, drive] : memory->drives) {
     for (const std::int64_t day : {20'000, 20'001}) {
       for (const Figure& grown : takeGrowth(drive, figures, {day * 86'400, "boot", day}))
-        require(grown.kind->course != Course::Gauge && drive.last.contains(grown.kind->name));
+        require(grown.kind->resets != Resets::NotACounter && drive.last.contains(grown.kind->name));
     }
   }
   memory->forgetOld(20'001 * std::int64_t{86'400});

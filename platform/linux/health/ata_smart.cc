@@ -21,17 +21,17 @@ enum Row : std::size_t {
   kFailing
 };
 constexpr FigureKind kKinds[] = {
-    {"smart_good", kPlain, Course::Gauge, "SMART RETURN STATUS", "1 good, 0 failing"},
-    {"temperature", kMillidegrees, Course::Gauge, "attribute 194 or 231", "temperature"},
-    {"power_on_hours", kPlain, Course::Lifetime, "attribute 9", "time under power"},
-    {"power_cycles", kEvents, Course::Lifetime, "attribute 12", "power cycles"},
-    {"bad_sectors", kEvents, Course::Gauge, "attributes 5 and 197",
+    {"smart_good", kPlain, Resets::NotACounter, "SMART RETURN STATUS", "1 good, 0 failing"},
+    {"temperature", kMillidegrees, Resets::NotACounter, "attribute 194 or 231", "temperature"},
+    {"power_on_hours", kPlain, Resets::Never, "attribute 9", "time under power"},
+    {"power_cycles", kEvents, Resets::Never, "attribute 12", "power cycles"},
+    {"bad_sectors", kEvents, Resets::NotACounter, "attributes 5 and 197",
      "reallocated sectors, and those that wait for reallocation"},
-    {"reallocated_sectors", kEvents, Course::Lifetime, "attribute 5", "reallocated sectors"},
-    {"pending_sectors", kEvents, Course::Gauge, "attribute 197",
+    {"reallocated_sectors", kEvents, Resets::Never, "attribute 5", "reallocated sectors"},
+    {"pending_sectors", kEvents, Resets::NotACounter, "attribute 197",
      "unstable sectors that wait for reallocation"},
-    {"crc_errors", kEvents, Course::Lifetime, "attribute 199", "errors on the cable"},
-    {"failing_attributes", kEvents, Course::Gauge, "all attributes",
+    {"crc_errors", kEvents, Resets::Never, "attribute 199", "errors on the cable"},
+    {"failing_attributes", kEvents, Resets::NotACounter, "all attributes",
      "pre-failure attributes at or below their thresholds"},
 };
 constexpr std::uint64_t kMillisecondsPerHour = 3'600'000;

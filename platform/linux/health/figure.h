@@ -23,11 +23,11 @@ inline constexpr Unit kEvents = 0x6400000000000000;
 enum class DriveKind : std::uint8_t { Nvme, Emmc, Ufs, Ata, Mtd, Ubi };
 std::string_view nameOf(DriveKind kind);
 
-/// How a figure changes over time.
-enum class Course : std::uint8_t {
-  Gauge,     // up and down
-  Lifetime,  // a counter that the drive keeps
-  Attached,  // a counter that starts from zero when the kernel attaches the drive
+/// When a counter starts again from zero.
+enum class Resets : std::uint8_t {
+  NotACounter,  // goes up and down
+  Never,        // the drive keeps it
+  OnAttach,     // when the kernel attaches the drive
 };
 
 /// Where a figure is in a log page, little-endian.
@@ -42,7 +42,7 @@ struct Place {
 struct FigureKind {
   std::string_view name;
   Unit unit;
-  Course course;
+  Resets resets;
   std::string_view source;
   std::string_view meaning;
   Place place = {};

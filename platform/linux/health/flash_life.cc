@@ -17,14 +17,14 @@ constexpr std::string_view kLifeB = "the same of memory type B";
 constexpr std::string_view kPreEol = "reserve blocks: 1 normal, 2 80 % used, 3 90 % used";
 
 constexpr FigureKind kEmmc[] = {
-    {"life_a_pct", kPlain, Course::Gauge, "EXT_CSD [268], life_time", kLifeA},
-    {"life_b_pct", kPlain, Course::Gauge, "EXT_CSD [269], life_time", kLifeB},
-    {"pre_eol", kPlain, Course::Gauge, "EXT_CSD [267], pre_eol_info", kPreEol},
+    {"life_a_pct", kPlain, Resets::NotACounter, "EXT_CSD [268], life_time", kLifeA},
+    {"life_b_pct", kPlain, Resets::NotACounter, "EXT_CSD [269], life_time", kLifeB},
+    {"pre_eol", kPlain, Resets::NotACounter, "EXT_CSD [267], pre_eol_info", kPreEol},
 };
 constexpr FigureKind kUfs[] = {
-    {"life_a_pct", kPlain, Course::Gauge, "life_time_estimation_a", kLifeA},
-    {"life_b_pct", kPlain, Course::Gauge, "life_time_estimation_b", kLifeB},
-    {"pre_eol", kPlain, Course::Gauge, "eol_info", kPreEol},
+    {"life_a_pct", kPlain, Resets::NotACounter, "life_time_estimation_a", kLifeA},
+    {"life_b_pct", kPlain, Resets::NotACounter, "life_time_estimation_b", kLifeB},
+    {"pre_eol", kPlain, Resets::NotACounter, "eol_info", kPreEol},
 };
 
 constexpr std::size_t kRevision = 192, kPreEolOffset = 267;

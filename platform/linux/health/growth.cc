@@ -15,7 +15,7 @@ constexpr std::int64_t kMemoryVersion = 1;
 
 // The growth of a counter since `last`; nothing when that cannot be known.
 std::optional<std::int64_t> step(const Figure& figure, std::int64_t last, bool isSameBoot) {
-  if (figure.kind->course == Course::Attached && (!isSameBoot || figure.value < last)) {
+  if (figure.kind->resets == Resets::OnAttach && (!isSameBoot || figure.value < last)) {
     return figure.value;
   }
   if (figure.value < last) return std::nullopt;
@@ -52,9 +52,9 @@ Figures takeGrowth(DriveMemory& memory, const Figures& figures, const Moment& mo
   const bool isSameBoot = memory.boot == moment.boot;
   Figures growth;
   for (const Figure& figure : figures) {
-    if (figure.kind->course == Course::Gauge) continue;
+    if (figure.kind->resets == Resets::NotACounter) continue;
     // Whether it began at 0 since the last reading is not known. The next one sees all it counted.
-    if (figure.kind->course == Course::Attached && moment.boot.empty()) continue;
+    if (figure.kind->resets == Resets::OnAttach && moment.boot.empty()) continue;
     const std::string name(figure.kind->name);
     const auto last = memory.last.find(name);
     const auto grownBy =

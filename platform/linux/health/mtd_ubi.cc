@@ -4,21 +4,22 @@ namespace tavrel::health {
 namespace {
 
 constexpr FigureKind kMtd[] = {
-    {"page_size", kBytes, Course::Gauge, "writesize", "smallest unit of writing"},
-    {"block_size", kBytes, Course::Gauge, "erasesize", "smallest unit of erasing"},
-    {"bad_blocks", kEvents, Course::Gauge, "bad_blocks", "factory and grown bad blocks"},
-    {"reserved_blocks", kEvents, Course::Gauge, "bbt_blocks",
+    {"page_size", kBytes, Resets::NotACounter, "writesize", "smallest unit of writing"},
+    {"block_size", kBytes, Resets::NotACounter, "erasesize", "smallest unit of erasing"},
+    {"bad_blocks", kEvents, Resets::NotACounter, "bad_blocks", "factory and grown bad blocks"},
+    {"reserved_blocks", kEvents, Resets::NotACounter, "bbt_blocks",
      "blocks that hold the table of bad blocks"},
-    {"ecc_failures", kEvents, Course::Attached, "ecc_failures", "uncorrectable reads"},
-    {"corrected_bits", kEvents, Course::Attached, "corrected_bits", "bits corrected"},
+    {"ecc_failures", kEvents, Resets::OnAttach, "ecc_failures", "uncorrectable reads"},
+    {"corrected_bits", kEvents, Resets::OnAttach, "corrected_bits", "bits corrected"},
 };
 constexpr FigureKind kUbi[] = {
-    {"erases_max", kEvents, Course::Lifetime, "max_ec", "erasures of the most used block"},
-    {"bad_blocks", kEvents, Course::Gauge, "bad_peb_count", "bad physical blocks"},
-    {"bad_block_reserve", kEvents, Course::Gauge, "reserved_for_bad",
+    {"erases_max", kEvents, Resets::Never, "max_ec", "erasures of the most used block"},
+    {"bad_blocks", kEvents, Resets::NotACounter, "bad_peb_count", "bad physical blocks"},
+    {"bad_block_reserve", kEvents, Resets::NotACounter, "reserved_for_bad",
      "blocks kept for those that go bad"},
-    {"blocks", kEvents, Course::Gauge, "total_eraseblocks", "logical blocks"},
-    {"free_blocks", kEvents, Course::Gauge, "avail_eraseblocks", "logical blocks not allocated"},
+    {"blocks", kEvents, Resets::NotACounter, "total_eraseblocks", "logical blocks"},
+    {"free_blocks", kEvents, Resets::NotACounter, "avail_eraseblocks",
+     "logical blocks not allocated"},
 };
 
 }  // namespace
