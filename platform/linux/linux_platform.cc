@@ -62,8 +62,8 @@ struct LinuxPlatform::Services {
   SegmentFold fold{root, store, fileSystem, propertyLists, log};
   FoldingStore foldingStore{store, fold, log};
   UnfoldedStore unfoldedStore{root, store, fileSystem, propertyLists, log};
-  ReportedDays statistics{options.readOnly ? static_cast<StatisticsStore&>(unfoldedStore)
-                                           : foldingStore};
+  DayNotingStore statistics{options.readOnly ? static_cast<StatisticsStore&>(unfoldedStore)
+                                             : foldingStore};
   FileSubmission submission{root,
                             {.files = fileSystem,
                              .propertyLists = propertyLists,

@@ -58,7 +58,7 @@ struct Service : ProcessServices {
 
   fakes::Journal journal;
   fakes::FakeStore store{journal};
-  ReportedDays days{store};
+  DayNotingStore days{store};
   LinuxSystemVersion version;
   FileSubmission submission;
 };

@@ -24,8 +24,8 @@
 #include "platform/linux/device/linux_system_version.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/day_noting_store.h"
 #include "platform/linux/logs/log_folder.h"
-#include "platform/linux/logs/reported_days.h"
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/preferences.h"
@@ -59,7 +59,7 @@ class FileSubmission final : public SubmissionService {
     PropertyListCoding& propertyLists;
     Preferences& preferences;          // as the run sees them
     FilePreferences& filePreferences;  // as storage has them
-    ReportedDays& reportedDays;        // the store that daily logs report
+    DayNotingStore& reportedDays;      // the store that daily logs report
     LinuxSystemVersion& systemVersion;
     Clock& clock;
     SystemLog& log;

@@ -1,4 +1,4 @@
-#include "platform/linux/logs/reported_days.h"
+#include "platform/linux/logs/day_noting_store.h"
 
 #include <algorithm>
 
@@ -6,7 +6,7 @@
 
 namespace tavrel {
 
-class ReportedDays::History final : public BHHistory {
+class DayNotingStore::History final : public BHHistory {
  public:
   History(std::unique_ptr<BHHistory> history, std::optional<std::int64_t>& earliest)
       : history_(std::move(history)), earliest_(earliest) {}
@@ -36,7 +36,7 @@ class ReportedDays::History final : public BHHistory {
   std::optional<std::int64_t>& earliest_;
 };
 
-std::unique_ptr<BHHistory> ReportedDays::initWithDefaultPath() {
+std::unique_ptr<BHHistory> DayNotingStore::initWithDefaultPath() {
   return std::make_unique<History>(store_.initWithDefaultPath(), earliest_);
 }
 

@@ -12,10 +12,10 @@
 
 namespace tavrel {
 
-class ReportedDays final : public StatisticsStore {
+class DayNotingStore final : public StatisticsStore {
  public:
   /// The store must outlive it, and it must outlive the histories that it returns.
-  explicit ReportedDays(StatisticsStore& store) : store_(store) {}
+  explicit DayNotingStore(StatisticsStore& store) : store_(store) {}
 
   /// The earliest day whose rows may have been read since the last call; nothing when none were.
   std::optional<std::int64_t> takeEarliest() { return std::exchange(earliest_, std::nullopt); }
