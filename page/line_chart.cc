@@ -14,14 +14,14 @@ constexpr int kHeight = 100;  // of the drawing; one day is one unit wide
 
 struct Range {
   double low = 0, high = 0;
-  std::size_t told = 0;
+  std::size_t known = 0;
 
   void take(const Values& values) {
     for (const auto& value : values) {
       if (!value || !std::isfinite(*value)) continue;
-      low = told == 0 ? *value : std::min(low, *value);
-      high = told == 0 ? *value : std::max(high, *value);
-      ++told;
+      low = known == 0 ? *value : std::min(low, *value);
+      high = known == 0 ? *value : std::max(high, *value);
+      ++known;
     }
   }
 };
@@ -34,13 +34,13 @@ int heightOf(double value, const Range& range) {
   return static_cast<int>(std::lround((1 - share) * kHeight));
 }
 
-bool isTold(const Values& values, std::size_t day) {
+bool isKnown(const Values& values, std::size_t day) {
   return day < values.size() && values[day] && std::isfinite(*values[day]);
 }
 
 // Where the run of days with values that begins at `day` ends.
 std::size_t endOfRun(const Values& values, std::size_t day) {
-  while (isTold(values, day))
+  while (isKnown(values, day))
     ++day;
   return day;
 }
@@ -92,9 +92,9 @@ std::string bandPath(const LineChart& chart, const Range& range) {
 }
 
 std::string nameOf(const LineChart& chart, const Range& line) {
-  if (line.told == 0) return chart.name + ": no data";
+  if (line.known == 0) return chart.name + ": no data";
   std::string name = format("%s: %s to %s, data for %zu of %zu days, lowest %s, highest %s",
-                            chart.name, chart.first, chart.last, line.told, chart.values.size(),
+                            chart.name, chart.first, chart.last, line.known, chart.values.size(),
                             chart.text(line.low), chart.text(line.high));
   for (auto value = chart.values.rbegin(); value != chart.values.rend(); ++value) {
     if (!*value || !std::isfinite(**value)) continue;
@@ -113,7 +113,7 @@ void writeLineChart(HtmlWriter& html, const LineChart& chart) {
   range.take(chart.highs);
   const std::size_t width = std::max<std::size_t>(chart.values.size(), 2) - 1;
   html.begin("div", {{"class", "line"}});
-  html.element("span", range.told == 0 ? "none" : chart.text(range.high), {{"class", "top"}});
+  html.element("span", range.known == 0 ? "none" : chart.text(range.high), {{"class", "top"}});
   if (range.low != range.high) html.element("span", chart.text(range.low), {{"class", "bottom"}});
   beginDrawing(html, nameOf(chart, line), width, kHeight);
   if (const std::string band = bandPath(chart, range); !band.empty())

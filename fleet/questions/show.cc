@@ -156,17 +156,17 @@ class SideAnswer {
     for (const auto& [log, value] : rows_.scalars) {
       if (partOf_[log] != sets.size()) classes[partOf_[log]].add(log, bucketOf(boundaries, value));
     }
-    std::vector<std::uint64_t> told(rows_.cells.empty() ? 0 : table_.size());
+    std::vector<std::uint64_t> counted(rows_.cells.empty() ? 0 : table_.size());
     for (const auto& [log, cell] : rows_.cells) {
       if (partOf_[log] == sets.size()) continue;
       classes[partOf_[log]].add(log, cell);
-      if (cell.lower < cell.upper) told[log] = saturatingAdd(told[log], cell.count);
+      if (cell.lower < cell.upper) counted[log] = saturatingAdd(counted[log], cell.count);
     }
     // Values that no histogram counts may lie anywhere. Without them, the histogram would cover
     // other logs than the five numbers do.
     for (const auto& [log, numbers] : rows_.distributions) {
-      if (partOf_[log] == sets.size() || told.empty() || told[log] >= numbers.count) continue;
-      classes[partOf_[log]].add(log, {-kInfinity, kInfinity, numbers.count - told[log]});
+      if (partOf_[log] == sets.size() || counted.empty() || counted[log] >= numbers.count) continue;
+      classes[partOf_[log]].add(log, {-kInfinity, kInfinity, numbers.count - counted[log]});
     }
     std::vector<Cell> all;
     HistogramAnswer& total = whole.histogram;

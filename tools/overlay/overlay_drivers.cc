@@ -29,14 +29,14 @@ class ToldClient final : public UserClient {
     const KernelReturn result =
         below_->callMethod(selector, scalarInput, structureInput, scalarOutput, structureOutput,
                            structureOutputLength);
-    events_.tell(Kind::DriverCall, format("%s method %u", name_, selector),
-                 outcomeOf(result, structureOutputLength));
+    events_.deliver(Kind::DriverCall, format("%s method %u", name_, selector),
+                    outcomeOf(result, structureOutputLength));
     return result;
   }
   KernelReturn mapMemory(std::uint32_t memoryType, std::unique_ptr<MappedMemory>& mapped) override {
     const KernelReturn result = below_->mapMemory(memoryType, mapped);
-    events_.tell(Kind::DriverCall, format("%s memory %u", name_, memoryType),
-                 outcomeOf(result, mapped ? mapped->bytes().size() : 0));
+    events_.deliver(Kind::DriverCall, format("%s memory %u", name_, memoryType),
+                    outcomeOf(result, mapped ? mapped->bytes().size() : 0));
     return result;
   }
   KernelReturn close() override { return below_->close(); }
@@ -55,22 +55,24 @@ class ToldService final : public DriverService {
   KernelReturn entryID(std::uint64_t& id) override { return below_->entryID(id); }
   KernelReturn name(std::string& name) override { return below_->name(name); }
   std::uint32_t userRetainCount() override { return below_->userRetainCount(); }
-  plist::Value property(std::string_view key) override { return told(key, below_->property(key)); }
+  plist::Value property(std::string_view key) override {
+    return delivered(key, below_->property(key));
+  }
   plist::Value searchProperty(std::string_view plane, std::string_view key) override {
-    return told(key, below_->searchProperty(plane, key));
+    return delivered(key, below_->searchProperty(plane, key));
   }
   KernelReturn open(std::uint32_t type, std::unique_ptr<UserClient>& client) override {
     const KernelReturn result = below_->open(type, client);
-    events_.tell(Kind::DriverCall, name_ + " open", outcomeOf(result, "opened"));
+    events_.deliver(Kind::DriverCall, name_ + " open", outcomeOf(result, "opened"));
     if (client) client = std::make_unique<ToldClient>(std::move(client), name_, events_);
     return result;
   }
 
  private:
-  plist::Value told(std::string_view key, plist::Value value) {
+  plist::Value delivered(std::string_view key, plist::Value value) {
     const bool isContainer = value.array() || value.dictionary();
-    events_.tell(Kind::DriverProperty, format("%s %s", name_, key),
-                 isContainer ? plist::Value(kindWithArticle(value)) : value);
+    events_.deliver(Kind::DriverProperty, format("%s %s", name_, key),
+                    isContainer ? plist::Value(kindWithArticle(value)) : value);
     return value;
   }
 
@@ -90,7 +92,7 @@ class ToldWalk final : public ServiceIterator {
     if (!service) return nullptr;
     std::string name;
     if (service->name(name) != kKernelSuccess) name = "(no name)";
-    events_.tell(Kind::Driver, name, "found");
+    events_.deliver(Kind::Driver, name, "found");
     return std::make_shared<ToldService>(std::move(service), std::move(name), events_);
   }
 
@@ -103,7 +105,7 @@ class ToldWalk final : public ServiceIterator {
 
 std::shared_ptr<DriverService> OverlayDrivers::firstService(std::string_view className) {
   auto service = below_.firstService(className);
-  events_.tell(Kind::Driver, std::string(className), service ? "found" : "not found");
+  events_.deliver(Kind::Driver, std::string(className), service ? "found" : "not found");
   if (!service) return nullptr;
   return std::make_shared<ToldService>(std::move(service), std::string(className), events_);
 }
@@ -111,7 +113,7 @@ std::shared_ptr<DriverService> OverlayDrivers::firstService(std::string_view cla
 KernelReturn OverlayDrivers::matchingServices(const plist::Dictionary& matching,
                                               std::unique_ptr<ServiceIterator>& services) {
   const KernelReturn result = below_.matchingServices(matching, services);
-  events_.tell(Kind::Drivers, inlineText(matching), outcomeOf(result, "answered"));
+  events_.deliver(Kind::Drivers, inlineText(matching), outcomeOf(result, "answered"));
   if (services) services = std::make_unique<ToldWalk>(std::move(services), events_);
   return result;
 }

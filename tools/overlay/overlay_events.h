@@ -53,7 +53,7 @@ class OverlayEvents {
   using Handler = std::function<void(const OverlayEvent&)>;
 
   void setHandler(Handler handler) { handler_ = std::move(handler); }
-  void tell(OverlayEvent::Kind kind, std::string subject, plist::Value value = {}) const {
+  void deliver(OverlayEvent::Kind kind, std::string subject, plist::Value value = {}) const {
     if (handler_) handler_({kind, std::move(subject), std::move(value)});
   }
 

@@ -7,9 +7,9 @@ namespace tavrel {
 
 Expected<std::string> OverlayFileReader::read(std::string_view path, std::size_t largest) {
   auto content = contentOf(path, largest);
-  events_.tell(OverlayEvent::Kind::File, std::string(path),
-               content ? plist::Value(std::uint64_t{content->size()})
-                       : plist::Value(content.error().message));
+  events_.deliver(OverlayEvent::Kind::File, std::string(path),
+                  content ? plist::Value(std::uint64_t{content->size()})
+                          : plist::Value(content.error().message));
   return content;
 }
 
@@ -17,8 +17,8 @@ std::optional<std::int64_t> OverlayFileReader::size(std::string_view path) {
   const auto at = replaced.find(path);
   const auto size =
       at == replaced.end() ? below_.size(path) : static_cast<std::int64_t>(at->second.size());
-  events_.tell(OverlayEvent::Kind::File, std::string(path),
-               size ? plist::Value(*size) : plist::Value());
+  events_.deliver(OverlayEvent::Kind::File, std::string(path),
+                  size ? plist::Value(*size) : plist::Value());
   return size;
 }
 
@@ -31,23 +31,23 @@ Expected<std::string> OverlayFileReader::contentOf(std::string_view path, std::s
 
 plist::Value OverlayAnswers::SQCopyAnswer(std::string_view question) {
   plist::Value answer = below_.SQCopyAnswer(question);
-  events_.tell(OverlayEvent::Kind::Answer, std::string(question), answer);
+  events_.deliver(OverlayEvent::Kind::Answer, std::string(question), answer);
   return answer;
 }
 
 SystemControls::Result OverlayControls::read(std::string_view name, MutableByteSpan buffer) {
   const Result result = below_.read(name, buffer);
-  events_.tell(OverlayEvent::Kind::Control, std::string(name),
-               result.errorNumber == 0
-                   ? plist::Value(plist::Data(ByteSpan(buffer).first(result.length)))
-                   : plist::Value(format("error %d, %s", result.errorNumber,
-                                         systemText(result.errorNumber))));
+  events_.deliver(OverlayEvent::Kind::Control, std::string(name),
+                  result.errorNumber == 0
+                      ? plist::Value(plist::Data(ByteSpan(buffer).first(result.length)))
+                      : plist::Value(format("error %d, %s", result.errorNumber,
+                                            systemText(result.errorNumber))));
   return result;
 }
 
 plist::Dictionary OverlaySystemVersion::systemVersionDictionary() {
   plist::Dictionary version = below_.systemVersionDictionary();
-  events_.tell(OverlayEvent::Kind::Fact, "system version", version);
+  events_.deliver(OverlayEvent::Kind::Fact, "system version", version);
   return version;
 }
 
@@ -58,15 +58,15 @@ void OverlayApplications::enumerateBundles(
     ++count;
     handler(bundle);
   });
-  events_.tell(OverlayEvent::Kind::Fact, "number of installed applications", count);
+  events_.deliver(OverlayEvent::Kind::Fact, "number of installed applications", count);
 }
 
 std::vector<std::string> OverlayLocale::preferredLanguages() {
-  return told("preferred languages", below_.preferredLanguages());
+  return delivered("preferred languages", below_.preferredLanguages());
 }
 
 std::vector<std::string> OverlayLocale::systemLanguages() {
-  return told("languages of the system", below_.systemLanguages());
+  return delivered("languages of the system", below_.systemLanguages());
 }
 
 std::vector<std::string> OverlayLocale::matchLocalizations(
@@ -76,21 +76,22 @@ std::vector<std::string> OverlayLocale::matchLocalizations(
 
 std::optional<std::string> OverlayLocale::countryCode() {
   auto code = below_.countryCode();
-  events_.tell(OverlayEvent::Kind::Fact, "country", code ? plist::Value(*code) : plist::Value());
+  events_.deliver(OverlayEvent::Kind::Fact, "country", code ? plist::Value(*code) : plist::Value());
   return code;
 }
 
-std::vector<std::string> OverlayLocale::told(const char* fact, std::vector<std::string> languages) {
+std::vector<std::string> OverlayLocale::delivered(const char* fact,
+                                                  std::vector<std::string> languages) {
   plist::Array list = plist::Array::create(languages.size());
   for (const std::string& language : languages)
     list.append(language);
-  events_.tell(OverlayEvent::Kind::Fact, fact, list);
+  events_.deliver(OverlayEvent::Kind::Fact, fact, list);
   return languages;
 }
 
 LibraryFunction OverlayLibrary::find(std::string_view function) {
   const LibraryFunction found = below_->find(function);
-  events_.tell(OverlayEvent::Kind::Library, std::string(function), found.index() != 0);
+  events_.deliver(OverlayEvent::Kind::Library, std::string(function), found.index() != 0);
   Preferences& preferences = preferences_;
   if (std::holds_alternative<IntegerPreferenceGetter>(found)) {
     return IntegerPreferenceGetter([&preferences](std::string_view key, std::string_view domain) {
@@ -108,7 +109,7 @@ LibraryFunction OverlayLibrary::find(std::string_view function) {
 
 std::unique_ptr<DynamicLibrary> OverlayLoader::load(std::string_view path) {
   auto library = below_.load(path);
-  events_.tell(OverlayEvent::Kind::Library, std::string(path), library != nullptr);
+  events_.deliver(OverlayEvent::Kind::Library, std::string(path), library != nullptr);
   if (!library) return nullptr;
   return std::make_unique<OverlayLibrary>(std::move(library), preferences_, events_);
 }

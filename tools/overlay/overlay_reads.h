@@ -89,7 +89,7 @@ class OverlayLocale final : public Locale {
   std::optional<std::string> countryCode() override;
 
  private:
-  std::vector<std::string> told(const char* fact, std::vector<std::string> languages);
+  std::vector<std::string> delivered(const char* fact, std::vector<std::string> languages);
 
   Locale& below_;
   const OverlayEvents& events_;

@@ -21,7 +21,7 @@ class OverlayHistory final : public BHHistory {
           ++rows;
           rowHandler(key, day, value, stop);
         });
-    tell("scalars", minDaysSince1970, maxDaysSince1970, rows);
+    deliver("scalars", minDaysSince1970, maxDaysSince1970, rows);
     return isComplete;
   }
   bool distributionsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
@@ -35,17 +35,17 @@ class OverlayHistory final : public BHHistory {
                                             ++rows;
                                             rowHandler(key, day, values, stop);
                                           });
-    tell("distributions", minDaysSince1970, maxDaysSince1970, rows);
+    deliver("distributions", minDaysSince1970, maxDaysSince1970, rows);
     return isComplete;
   }
 
  private:
-  void tell(const char* what, std::int64_t before, std::int64_t last, std::uint64_t rows) const {
+  void deliver(const char* what, std::int64_t before, std::int64_t last, std::uint64_t rows) const {
     const bool isOneDay = last - 1 == before;
-    events_.tell(OverlayEvent::Kind::Statistics,
-                 isOneDay ? format("%s of day %lld", what, last)
-                          : format("%s after day %lld up to %lld", what, before, last),
-                 rows);
+    events_.deliver(OverlayEvent::Kind::Statistics,
+                    isOneDay ? format("%s of day %lld", what, last)
+                             : format("%s after day %lld up to %lld", what, before, last),
+                    rows);
   }
 
   std::unique_ptr<BHHistory> below_;
@@ -57,16 +57,16 @@ class OverlayHistory final : public BHHistory {
 void OverlayLog::write(LogLevel level, std::string_view message) {
   constexpr const char* kNames[] = {"debug", "info", "default", "error"};
   if (level == LogLevel::Error) lastError = message;
-  events_.tell(OverlayEvent::Kind::LogLine, kNames[static_cast<std::size_t>(level)],
-               std::string(message));
+  events_.deliver(OverlayEvent::Kind::LogLine, kNames[static_cast<std::size_t>(level)],
+                  std::string(message));
 }
 
 void OverlayStreams::writeOutput(std::string_view text) {
-  events_.tell(OverlayEvent::Kind::OutputText, "on standard output", std::string(text));
+  events_.deliver(OverlayEvent::Kind::OutputText, "on standard output", std::string(text));
 }
 
 void OverlayStreams::writeError(std::string_view text) {
-  events_.tell(OverlayEvent::Kind::ErrorText, "on standard error", std::string(text));
+  events_.deliver(OverlayEvent::Kind::ErrorText, "on standard error", std::string(text));
 }
 
 plist::Value OverlayPreferences::ZTXPreferencesGetValue(std::string_view key,
@@ -74,25 +74,25 @@ plist::Value OverlayPreferences::ZTXPreferencesGetValue(std::string_view key,
   const auto at = written_.find(std::pair(std::string(domain), std::string(key)));
   plist::Value value =
       at == written_.end() ? below_.ZTXPreferencesGetValue(key, domain) : deepCopy(at->second);
-  events_.tell(OverlayEvent::Kind::Preference, format("%s %s", domain, key), value);
+  events_.deliver(OverlayEvent::Kind::Preference, format("%s %s", domain, key), value);
   return value;
 }
 
 void OverlayPreferences::ZTXPreferencesSetValue(std::string_view key, const plist::Value& value,
                                                 std::string_view domain) {
   written_[std::pair(std::string(domain), std::string(key))] = deepCopy(value);
-  events_.tell(value ? OverlayEvent::Kind::SetPreference : OverlayEvent::Kind::RemovePreference,
-               format("%s %s", domain, key), value);
+  events_.deliver(value ? OverlayEvent::Kind::SetPreference : OverlayEvent::Kind::RemovePreference,
+                  format("%s %s", domain, key), value);
 }
 
 bool OverlayPreferences::ZTXPreferencesSynchronize(std::string_view domain) {
-  events_.tell(OverlayEvent::Kind::WritePreferences, std::string(domain));
+  events_.deliver(OverlayEvent::Kind::WritePreferences, std::string(domain));
   return true;
 }
 
 bool OverlaySubmission::isDiagnosticSubmissionEnabled() {
   const bool isEnabled = below_.isDiagnosticSubmissionEnabled();
-  if (!isEnabled) tellDeletion();
+  if (!isEnabled) deliverDeletion();
   return isEnabled;
 }
 
@@ -111,14 +111,14 @@ bool OverlaySubmission::ZTXWriteLogForSubmission(std::string_view logType, std::
   const auto place = below_.placeOfNewLog(logType);
   if (place && *place == FileSubmission::Place::Withheld) what.set("withheld", true);
   what.set("content", log.bytes);
-  events_.tell(OverlayEvent::Kind::Submission, log.name, what);
+  events_.deliver(OverlayEvent::Kind::Submission, log.name, what);
   logs.push_back(std::move(log));
   return true;
 }
 
 std::string OverlaySubmission::ZTXOSVersion() {
   std::string version = below_.ZTXOSVersion();
-  events_.tell(OverlayEvent::Kind::Fact, "OS version", version);
+  events_.deliver(OverlayEvent::Kind::Fact, "OS version", version);
   return version;
 }
 
@@ -128,14 +128,14 @@ plist::Value OverlaySubmission::ZTXGetDATaskingValue(std::string_view key) {
 
 void OverlaySubmission::submitDiagnosticLogs() {
   const Status permitted = below_.checkPermission();
-  events_.tell(OverlayEvent::Kind::SendOn,
-               permitted ? "the pending logs" : "nothing: " + permitted.error().message);
+  events_.deliver(OverlayEvent::Kind::SendOn,
+                  permitted ? "the pending logs" : "nothing: " + permitted.error().message);
 }
 
-void OverlaySubmission::tellDeletion() {
+void OverlaySubmission::deliverDeletion() {
   const std::size_t waiting = below_.countOfWaiting();
   if (waiting == 0) return;
-  events_.tell(OverlayEvent::Kind::CleanUp, "logs that wait without permission", waiting);
+  events_.deliver(OverlayEvent::Kind::CleanUp, "logs that wait without permission", waiting);
 }
 
 std::int32_t OverlayStore::BHDaysSince1970() {
@@ -147,12 +147,12 @@ plist::Date OverlayStore::dateForDaysSince1970(std::int32_t day) {
 }
 
 bool OverlayStore::BHClientCheckpoint() {
-  events_.tell(OverlayEvent::Kind::Checkpoint, "the statistics store");
+  events_.deliver(OverlayEvent::Kind::Checkpoint, "the statistics store");
   return true;
 }
 
 void OverlayStore::BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) {
-  events_.tell(OverlayEvent::Kind::SetScalar, std::string(key), value);
+  events_.deliver(OverlayEvent::Kind::SetScalar, std::string(key), value);
 }
 
 std::unique_ptr<BHHistory> OverlayStore::initWithDefaultPath() {
@@ -161,45 +161,45 @@ std::unique_ptr<BHHistory> OverlayStore::initWithDefaultPath() {
 
 void OverlayCrashReporting::FLLogStructuredData(std::uint32_t logType,
                                                 const plist::Dictionary& record) {
-  events_.tell(OverlayEvent::Kind::Record, format("type %u", logType), record);
+  events_.deliver(OverlayEvent::Kind::Record, format("type %u", logType), record);
 }
 
 void OverlayCrashReporting::FLDumpAllOldStructuredDataLogs() {
   plist::Array names = plist::Array::create();
   for (const std::string& name : below_.oldRecordFiles())
     names.append(name);
-  events_.tell(OverlayEvent::Kind::CleanUp, "old files of structured records", names);
+  events_.deliver(OverlayEvent::Kind::CleanUp, "old files of structured records", names);
 }
 
 void OverlayCrashReporting::rollNorvaneCareLogs() {
-  events_.tell(OverlayEvent::Kind::RollOver, below_.hasSupportLog()
-                                                 ? "the support log"
-                                                 : "nothing: the support log is empty or missing");
+  events_.deliver(
+      OverlayEvent::Kind::RollOver,
+      below_.hasSupportLog() ? "the support log" : "nothing: the support log is empty or missing");
 }
 
 std::string OverlayCrashReporting::systemIdentifier() {
-  return told("system identifier", below_.systemIdentifier());
+  return delivered("system identifier", below_.systemIdentifier());
 }
 
 std::string OverlayCrashReporting::hardwareModel() {
-  return told("hardware model", below_.hardwareModel());
+  return delivered("hardware model", below_.hardwareModel());
 }
 
 std::string OverlayCrashReporting::osVersion() {
-  return told("OS version", below_.osVersion());
+  return delivered("OS version", below_.osVersion());
 }
 
 std::string OverlayCrashReporting::incidentIdentifier() {
   return below_.incidentIdentifier();
 }
 
-std::string OverlayCrashReporting::told(const char* fact, std::string text) {
-  events_.tell(OverlayEvent::Kind::Fact, fact, text);
+std::string OverlayCrashReporting::delivered(const char* fact, std::string text) {
+  events_.deliver(OverlayEvent::Kind::Fact, fact, text);
   return text;
 }
 
 void OverlayNotifications::post(std::string_view name) {
-  events_.tell(OverlayEvent::Kind::Notification, std::string(name));
+  events_.deliver(OverlayEvent::Kind::Notification, std::string(name));
 }
 
 }  // namespace tavrel

@@ -81,7 +81,7 @@ class OverlaySubmission final : public SubmissionService {
     std::string& bytes_;
   };
 
-  void tellDeletion();
+  void deliverDeletion();
 
   FileSubmission& below_;
   const OverlayEvents& events_;
@@ -117,7 +117,7 @@ class OverlayCrashReporting final : public CrashReporting {
   std::string incidentIdentifier() override;
 
  private:
-  std::string told(const char* fact, std::string text);
+  std::string delivered(const char* fact, std::string text);
 
   FileCrashReporting& below_;
   const OverlayEvents& events_;

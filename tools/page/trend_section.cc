@@ -96,20 +96,20 @@ void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& tre
 
 void writeRow(const RecordedDays& recorded, page::Table& table, const Trend& trend) {
   const std::string_view unit = catalogue::unitOf(trend.key);
-  std::size_t told = 0;
+  std::size_t known = 0;
   double low = 0, high = 0, last = 0;
   for (const auto& value : valuesOf(recorded, trend)) {
     if (!value) continue;
-    low = told == 0 ? *value : std::min(low, *value);
-    high = told == 0 ? *value : std::max(high, *value);
+    low = known == 0 ? *value : std::min(low, *value);
+    high = known == 0 ? *value : std::max(high, *value);
     last = *value;
-    ++told;
+    ++known;
   }
   table.row();
   table.cell([&](page::HtmlWriter& cell) { writeKey(cell, trend.key); });
-  table.cell(std::to_string(told));
+  table.cell(std::to_string(known));
   for (const double value : {low, high, last})
-    table.cell(told == 0 ? "none" : page::figureText(value, unit));
+    table.cell(known == 0 ? "none" : page::figureText(value, unit));
 }
 
 }  // namespace
