@@ -135,8 +135,8 @@ void readNotes(Device& device, std::string_view content) {
   device.write("/run/tavrel/fold.lock", content);
   auto notes = FoldNotes::lock(device.root, device.files, device.log);
   require(static_cast<bool>(notes));
-  const bool isNew = notes->tell("a line");
-  require(!isNew || !notes->tell("a line"));
+  const bool isNew = notes->logOnce("a line");
+  require(!isNew || !notes->logOnce("a line"));
   notes->save();
 }
 

@@ -34,16 +34,16 @@ FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), 
   content.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
   uncountedFiles_ = loadLittle64(asBytes(content), 0).value_or(0);
   for (std::size_t at = 8; at + 8 <= content.size(); at += 8)
-    told_.insert(*loadLittle64(asBytes(content), at));
+    logged_.insert(*loadLittle64(asBytes(content), at));
 }
 
-bool FoldNotes::tell(std::string_view line) {
+bool FoldNotes::logOnce(std::string_view line) {
   const std::uint64_t digest = *loadLittle64(sha256(asBytes(line)), 0);
-  if (told_.contains(digest)) return false;
-  if (told_.size() >= kRemembered) return true;
-  told_.insert(digest);
+  if (logged_.contains(digest)) return false;
+  if (logged_.size() >= kRemembered) return true;
+  logged_.insert(digest);
   hasChanged_ = true;
-  if (told_.size() <= limits::kFoldRefusalLines) {
+  if (logged_.size() <= limits::kFoldRefusalLines) {
     log_.write(LogLevel::Error, line);
   } else {
     ++leftOut_;
@@ -52,7 +52,7 @@ bool FoldNotes::tell(std::string_view line) {
 }
 
 void FoldNotes::refuse(std::string_view line) {
-  if (!tell(line)) return;
+  if (!logOnce(line)) return;
   ++uncountedFiles_;
   hasChanged_ = true;
 }
@@ -87,8 +87,8 @@ void FoldNotes::save() {
     content += asText(bytes);
   };
   append(uncountedFiles_);
-  for (const std::uint64_t told : told_)
-    append(told);
+  for (const std::uint64_t digest : logged_)
+    append(digest);
   if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {
     log_.log(LogLevel::Error, "cannot write %s: refusals will be logged again", kLockPath);
   }

@@ -27,9 +27,9 @@ class FoldNotes {
 
   /// Logs a line, unless it was seen before or is one too many. True when it is new, or when too
   /// many are remembered to know.
-  bool tell(std::string_view line);
+  bool logOnce(std::string_view line);
 
-  /// The same about a refused file, which is counted when `tell` is true.
+  /// The same about a refused file, which is counted when `logOnce` is true.
   void refuse(std::string_view line);
   /// Refused files that no store counts yet, with those of earlier folds, which failed.
   std::uint64_t uncountedFiles() const { return uncountedFiles_; }
@@ -50,7 +50,7 @@ class FoldNotes {
 
   Descriptor file_;
   SystemLog& log_;
-  std::unordered_set<std::uint64_t> told_;  // first 8 bytes of the lines' SHA-256
+  std::unordered_set<std::uint64_t> logged_;  // first 8 bytes of the lines' SHA-256
   std::uint64_t uncountedFiles_ = 0;
   bool hasChanged_ = false;
   std::uint64_t leftOut_ = 0;

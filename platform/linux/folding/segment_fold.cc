@@ -76,7 +76,7 @@ class FoldRun {
   /// Whether the values of a segment may be taken now. If not, notes why.
   bool admit(const SegmentName& name);
   /// Says that segments of a user exceed a limit. `limit` says which, and what to do.
-  void tellOfLimit(std::uint32_t owner, std::string_view limit);
+  void logLimit(std::uint32_t owner, std::string_view limit);
   bool isStoreFull() const;
   void finishSegments();
 
@@ -94,7 +94,7 @@ class FoldRun {
   std::set<std::uint32_t> unseen_;    // users with segments of unknown identity
   std::vector<SegmentName> removed_;  // their positions would keep new segments waiting
   std::map<std::uint32_t, std::uint64_t> values_;
-  std::set<std::uint32_t> toldUsers_;
+  std::set<std::uint32_t> namedUsers_;
   std::size_t next_ = 0;  // in the listing
   bool hasReplacedStore_ = false;
 
@@ -110,7 +110,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   for (const auto& [owner, count] : listing.leftOut) {
     unseen_.insert(owner);
     report_.waiting += count;
-    tellOfLimit(owner, kManySegments);
+    logLimit(owner, kManySegments);
   }
   unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
@@ -133,8 +133,8 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   return Done{};
 }
 
-void FoldRun::tellOfLimit(std::uint32_t owner, std::string_view limit) {
-  notes_.tell(format("segments of user %u wait: %s", owner, limit));
+void FoldRun::logLimit(std::uint32_t owner, std::string_view limit) {
+  notes_.logOnce(format("segments of user %u wait: %s", owner, limit));
 }
 
 Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& listing) {
@@ -215,23 +215,23 @@ bool FoldRun::isStoreFull() const {
 
 bool FoldRun::admit(const SegmentName& name) {
   if (name.owner != 0 && isStoreFull()) {
-    notes_.tell(
+    notes_.logOnce(
         "the statistics store is far beyond its limit: what users other than root record waits "
         "until days are reported and removed; see 'tavrelctl limits'");
     return false;
   }
   if (values_[name.owner] >= limits::kFoldValuesPerUser) {
-    tellOfLimit(name.owner, kManyValues);
+    logLimit(name.owner, kManyValues);
     return false;
   }
   if (report_.values + counts_.values >= limits::kFoldValues) {
-    notes_.tell(
+    notes_.logOnce(
         "segments wait: the fold has taken as many measurements of all users as it may; fold more "
         "often");
     return false;
   }
   if (positions_.admit(name)) return true;
-  tellOfLimit(name.owner, kManySegments);
+  logLimit(name.owner, kManySegments);
   return false;
 }
 
@@ -240,8 +240,8 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
   auto stored = storedPosition(batch, name);
   if (!stored) return stored.error();
   if (!*stored) {
-    notes_.tell("a segment of user " + std::to_string(name.owner) +
-                " waits: another version of this program began to fold it; restart the device");
+    notes_.logOnce("a segment of user " + std::to_string(name.owner) +
+                   " waits: another version of this program began to fold it; restart the device");
     ++report_.waiting;
     return Done{};
   }
@@ -260,7 +260,7 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
         positions_.hasRoom(batch, name.owner, before.size(), reader.positionBytes());
     if (!hasRoom) return hasRoom.error();
     if (!*hasRoom) {
-      tellOfLimit(name.owner, kLargePositions);
+      logLimit(name.owner, kLargePositions);
       ++report_.waiting;
       return Done{};
     }
@@ -297,8 +297,8 @@ Expected<std::optional<FoldRun::Stored>> FoldRun::storedPosition(SqliteBatch& ba
 
 void FoldRun::count(const SegmentName& name, const SegmentIntake& intake,
                     const SegmentProgress& progress) {
-  if (!intake.foreignKey().empty() && toldUsers_.insert(name.owner).second) {
-    notes_.tell(
+  if (!intake.foreignKey().empty() && namedUsers_.insert(name.owner).second) {
+    notes_.logOnce(
         format("user %u may not record %s, and such values are refused: give the user a "
                "prefix in /etc/tavrel/recorders.plist, or use another key",
                name.owner, quotedText(std::string_view(intake.foreignKey()).substr(0, 80))));
@@ -380,7 +380,7 @@ FoldReport SegmentFold::run() {
     report.failure = notes.error().message;
     return report;
   }
-  if (!cleared) notes->tell(cleared.error().message);
+  if (!cleared) notes->logOnce(cleared.error().message);
   const Expected<SegmentFolder::Listing> listing = (*folder)->list();
   if (!listing) {
     report.failure = listing.error().message;

@@ -80,7 +80,7 @@ void SqliteBatch::setDamagedValuesAside() {
     const std::string line = kept_.setAsideIfDamaged();
     if (!line.empty()) site_.log.write(LogLevel::Error, line);
   } catch (const StoreFailure& failure) {
-    site_.tell(failure, "; the values kept beside the store are damaged and stay");
+    site_.logFailure(failure, "; the values kept beside the store are damaged and stay");
   }
 }
 
@@ -265,8 +265,8 @@ void SqliteBatch::writeDistributions() {
         } catch (const RowFailure& failure) {
           if (!refuses_) throw;
           if (refused_ == 0) {
-            site_.tell(failure, "; what was recorded for " + quotedText(key.substr(0, 80)) +
-                                    " on day " + std::to_string(day) + " is refused");
+            site_.logFailure(failure, "; what was recorded for " + quotedText(key.substr(0, 80)) +
+                                          " on day " + std::to_string(day) + " is refused");
           }
           refused_ += added.values.size() / kPackedValueBytes;
         }
@@ -304,7 +304,7 @@ void SqliteBatch::limitLog() {
   try {
     connection_.checkpoint(false);
   } catch (const StoreFailure& failure) {
-    site_.tell(failure, "; the write-ahead log stays as it is");
+    site_.logFailure(failure, "; the write-ahead log stays as it is");
   }
 }
 

@@ -163,7 +163,7 @@ bool SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                         BHHistoryDistributionEnumerator& values,
                         bool& stop) { rowHandler(key, day, values, stop); },
           [&](const StoreFailure& failure) {
-            site_.tell(failure);
+            site_.logFailure(failure);
             isComplete = false;
           });
     });
@@ -369,13 +369,13 @@ void SqliteHistory::readRow(SqliteStatement& row, ChunkReader& reader,
 }
 
 void SqliteHistory::report(const StoreFailure& failure) {
-  std::optional<StoreFailure> untold = failure;
+  std::optional<StoreFailure> unlogged = failure;
   if (failure.fault == StoreFault::Damaged && !store_->lockless) {
     store_.reset();
     setIncomplete();
-    untold = site_.setAside(identity_, failure);
+    unlogged = site_.setAside(identity_, failure);
   }
-  if (untold) site_.tell(*untold);
+  if (unlogged) site_.logFailure(*unlogged);
 }
 
 }  // namespace tavrel

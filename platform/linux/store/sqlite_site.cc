@@ -78,9 +78,9 @@ std::string StoreSite::describe(const StoreFailure& failure) const {
   return "statistics store " + path + ": " + failure.message;
 }
 
-void StoreSite::tell(const StoreFailure& failure, std::string_view consequence) const {
+void StoreSite::logFailure(const StoreFailure& failure, std::string_view consequence) const {
   const bool passes = failure.fault == StoreFault::Busy || failure.fault == StoreFault::Other;
-  if (!passes && !told->insert(failure.message).second) return;
+  if (!passes && !logged->insert(failure.message).second) return;
   log.write(LogLevel::Error, describe(failure).append(consequence));
 }
 

@@ -65,7 +65,7 @@ struct StoreSite {
   /// files beside the store.
   bool changesNothing = false;
   /// Failures already logged. Those that last until somebody intervenes are logged only once.
-  std::shared_ptr<std::set<std::string>> told = std::make_shared<std::set<std::string>>();
+  std::shared_ptr<std::set<std::string>> logged = std::make_shared<std::set<std::string>>();
 
   /// "statistics store PATH: MESSAGE".
   std::string describe(const StoreFailure& failure) const;
@@ -81,7 +81,7 @@ struct StoreSite {
   }
 
   /// One line in the system log, with `consequence` at its end.
-  void tell(const StoreFailure& failure, std::string_view consequence = {}) const;
+  void logFailure(const StoreFailure& failure, std::string_view consequence = {}) const;
 
   /// Renames a damaged store and its log files, counts and logs that, once a second look has
   /// confirmed the damage. `damaged` is the file that was found damaged: nothing is done when

@@ -102,7 +102,7 @@ bool SqliteStore::commit(std::optional<SqliteConnection>& connection) {
 
 bool SqliteStore::keep(const StoreFailure& failure) {
   if (pending_.empty()) {
-    site_.tell(failure, "; kept values wait for the next commit");
+    site_.logFailure(failure, "; kept values wait for the next commit");
     return true;
   }
   std::vector<KeptValue> values;
@@ -118,14 +118,15 @@ bool SqliteStore::keep(const StoreFailure& failure) {
     if (!damage.empty()) site_.log.write(LogLevel::Error, damage);
     const auto dropped = kept.add(std::move(values));
     if (!dropped) throw StoreFailure{StoreFault::Device, dropped.error().message};
-    site_.tell(failure, count + (isOne ? "waits" : "wait") + " for the next commit");
+    site_.logFailure(failure, count + (isOne ? "waits" : "wait") + " for the next commit");
     if (*dropped > 0) {
       site_.log.log(LogLevel::Error, "%s-kept is full: the %llu earliest values are dropped",
                     site_.path, std::uint64_t{*dropped});
     }
     return true;
   } catch (const StoreFailure& obstacle) {
-    site_.tell(failure, count + (isOne ? "is" : "are") + " not kept yet: " + obstacle.message);
+    site_.logFailure(failure,
+                     count + (isOne ? "is" : "are") + " not kept yet: " + obstacle.message);
     return false;
   }
 }
@@ -152,7 +153,7 @@ void SqliteStore::checkpoint(std::optional<SqliteConnection> connection) {
                                       "need stays there until the next checkpoint"}));
     }
   });
-  if (failure) site_.tell(*failure);
+  if (failure) site_.logFailure(*failure);
 }
 
 Expected<ErasedRows> SqliteStore::erase(const RowRange& range) {
@@ -197,7 +198,7 @@ std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
   std::unique_ptr<SqliteHistory> history;
   const auto failure = attempt([&](const auto& identity) { history = openForReading(identity); });
   if (failure) {
-    site_.tell(*failure);
+    site_.logFailure(*failure);
     history = std::make_unique<SqliteHistory>(site_, std::nullopt, std::nullopt);
   } else if (!history->hasStore()) {
     site_.log.write(LogLevel::Info,
