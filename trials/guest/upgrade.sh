@@ -14,6 +14,7 @@ expect "other users are refused" 1 "$(setpriv --reuid recorder --clear-groups \
 systemctl disable --quiet --now tavrel-health.timer
 exported() { tavrelctl stat export | grep -F com.example. | sort; }
 before=$(exported)
+expect "there are statistics to keep" 0 "$([ -n "$before" ]; echo $?)"
 if [ "$extent" = whole ]; then
   # The second package is being unpacked, and the first is not configured yet.
   : >/root/dpkg.log

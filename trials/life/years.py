@@ -165,6 +165,13 @@ class Years(Mishaps):
         for name, number in sorted(self.device.kills.items()):
             print(f"{number:9} kills of {name}")
 
+    def check_mishaps(self, can_fill_disk):
+        """What befalls every device in ten years must have taken place here."""
+        for name in ("tavrel", "tavrelctl stat fold", "tavrelctl deny", "recorder"):
+            expect(self.device.kills[name], f"no {name} was killed")
+        expect(not can_fill_disk or self.counts.get("daily runs that a full disk disturbs"),
+               "no daily run found the disk full")
+
     def reason(self, day, last):
         """Why there was no run for a day that is not reported."""
         if {day, day + 1} & self.off:
