@@ -35,7 +35,7 @@ std::int64_t takeWhole(double value, double& remainder) {
   constexpr double kRoundingError = 1e-9;
   const double sum = value + remainder;
   const double whole = std::floor(sum + kRoundingError);
-  remainder = std::isfinite(sum) ? sum - whole : 0;
+  remainder = sum - whole;
   return saturatingInt64(whole);
 }
 
