@@ -50,7 +50,7 @@ struct Device : DeviceServices {
                                      {"LogName", "log-tallied"},
                                      {"OSVersion", version},
                                      {"Time", clock.time},
-                                     {"Options", plist::Dictionary{{"a&b", "x y"}, {"c", 7}}}};
+                                     {"Options", plist::Dictionary{{"c", 7}, {"a&b", "x y"}}}};
     write(kSubmission + place + name + ".metadata.plist", *coding.encodeXml(metadata));
     write(kSubmission + place + name + ".log", "content of " + name);
   }

@@ -97,7 +97,9 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
       {head + lan + down, rejected, "there is no default route"},
       {head + lan + down + eth, rejected, ""},
       {head + eth + row("wwan0", "00000000", "0003", 50), "", "the network is metered (wwan0)"},
-      {head, row6("00000400 1 0 00000003 wwan1"), "the network is metered (wwan1)"},
+      {head + eth + row("wwan0", "00000000", "0003", 700), "", ""},
+      {head, row6("00000400 1 0 00000003 eth0") + row6("000000ff 1 0 00000003 wwan1"),
+       "the network is metered (wwan1)"},
       {"garbage\n\n" + eth.substr(0, 20), "x", "there is no default route"}};
   Device device;
   device.add(nameOf(1));
@@ -122,6 +124,8 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   EXPECT_EQ(device.state().failure,
             "logs wait: cannot find a route: neither /proc/self/net/route nor "
             "/proc/self/net/ipv6_route exists; mount /proc");
+  device.configuration.needsDefaultRoute = false;
+  EXPECT_EQ(reason("logs.example.com"), "");
 }
 
 TEST(Upload, PausesLongerFromFailureToFailure) {
@@ -158,6 +162,7 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
       {"<key>Url</key><string/>", "Url is not a setting: see tavrel-upload(8)"},
       {"<key>StallSeconds</key><integer>0</integer>", "StallSeconds" + noTime},
       {"<key>RunSeconds</key><real>5</real>", "RunSeconds" + noTime},
+      {"<key>RunSeconds</key><integer>86401</integer>", "RunSeconds" + noTime},
       {"<key>AllowPlainHTTP</key><integer>1</integer>",
        "AllowPlainHTTP is not a boolean: give true or false"},
       {"<key>MeteredInterfaces</key><array><true/></array>",
@@ -173,6 +178,17 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
   fs::permissions(at, fs::perms(0644));
   EXPECT_EQ(configured(good)->host, "::1");
   EXPECT_EQ(configured(good)->url, "https://[::1]:8443/a");
+  const auto set = configured(
+      "<key>URL</key><string>https://LOCALHOST/a</string><key>NeedsDefaultRoute</key><false/>"
+      "<key>ConnectSeconds</key><integer>1</integer><key>StallSeconds</key><integer>2</integer>"
+      "<key>TransferSeconds</key><integer>3</integer><key>RunSeconds</key><integer>86400</integer>"
+      "<key>MeteredInterfaces</key><array><string>wwan*</string></array>");
+  ASSERT_TRUE(set);
+  EXPECT_EQ(std::tuple(set->host, set->connect.count(), set->stall.count(), set->transfer.count(),
+                       set->run.count(), set->needsDefaultRoute, set->meteredInterfaces),
+            std::tuple("localhost", 1, 2, 3, 86'400, false, Lines{"wwan*"}));
+  EXPECT_FALSE(set->mayBePlain);
+  device.configure(good);
   device.write("/credentials/tavrel-upload.token", "two words\n");
   EXPECT_EQ(configured(good).error().message,
             "cannot use the credential tavrel-upload.token: a token has letters, digits and "
