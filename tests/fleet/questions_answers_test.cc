@@ -254,6 +254,23 @@ TEST(PrivacyTest, NothingSmallFollowsFromTwoDivisions) {
   EXPECT_GT(groups, 1000u);
 }
 
+TEST(PrivacyTest, AChainOfManyGroupsIsJoined) {
+  TestFleet fleet;
+  for (int i = 0; i < 28; i += 2) {
+    for (auto [devices, version, region] : {std::array{5, i, i},
+                                            {3, i + 1, i},
+                                            {5, i + 1, i + 1},
+                                            {2, i, i + 1},
+                                            {1, i < 26 ? i + 2 : 2, i + 1}})
+      while (devices-- > 0)
+        fleet.add(1, std::to_string(100 + version), std::to_string(100 + region));
+  }
+  const LogTable table(fleet.engine());
+  Ledger ledger(table, 5);
+  const auto regions = titles(summarise(fleet.engine(), ledger, {}).parts[1].groups);
+  EXPECT_EQ(regions.back(), "(other) 24/24") << "100 and 101 less both versions: one device";
+}
+
 TEST(PrivacyTest, JoinsTheSameGroupsInWhateverOrderTheLogsWereLoaded) {
   const struct {
     const char* region;

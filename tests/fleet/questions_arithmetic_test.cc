@@ -193,10 +193,10 @@ TEST(DayRangeTest, ReadsWhatPeopleWrite) {
                                "YYYY-MM-DD, or a number of days");
   }
   std::vector<std::string> versions = {
-      "Pellio 4.10 (A)", "Pellio 4.9 (B)", "Pellio 4", "", "10", "9"};
+      "Pellio 4.10 (A)", "Pellio 4.9 (B)", "Pellio 4.09 (A)", "Pellio 4", "", "10", "9"};
   std::sort(versions.begin(), versions.end(), versionLess);
-  EXPECT_THAT(versions,
-              ElementsAre("", "9", "10", "Pellio 4", "Pellio 4.9 (B)", "Pellio 4.10 (A)"));
+  EXPECT_THAT(versions, ElementsAre("", "9", "10", "Pellio 4", "Pellio 4.09 (A)", "Pellio 4.9 (B)",
+                                    "Pellio 4.10 (A)"));
 }
 
 }  // namespace
