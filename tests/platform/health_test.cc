@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include "platform/linux/health/ata_smart.h"
+#include "platform/linux/health/drives.h"
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/nvme_logs.h"
 #include "platform/linux/health/reader.h"
@@ -64,6 +65,17 @@ TEST(HealthTest, NvmeSmartLog) {
       {"error_log_entries", 0},    {"warning_temp_minutes", 0}, {"critical_temp_minutes", 0},
       {"throttle_light", 0},       {"throttle_heavy", 0}};
   EXPECT_EQ(values, expected);  // no "read" (0 units), no "power_cycles" (all ones)
+}
+
+TEST(HealthTest, FieldsAreWhereTheirSourcesSay) {
+  for (const auto& [page, kinds] :
+       {std::pair("02h", nvmeSmartKinds()), std::pair("C0h", nvmeOcpKinds())}) {
+    for (const FigureKind& kind : kinds) {
+      const int first = kind.place.offset, last = first + kind.place.width - 1;
+      EXPECT_EQ(kind.source, first == last ? format("log %s byte %d", page, first)
+                                           : format("log %s bytes %d-%d", page, first, last));
+    }
+  }
 }
 
 TEST(HealthTest, RefusesShortAndLyingLogs) {
@@ -253,7 +265,8 @@ class HealthReaderTest : public testing::Test, protected TemporaryRoot {
     write(folder + "/model", "Disk\n");
     write(folder + "/firmware_rev", "1.0\n");
     write(folder + "/serial", serial);
-    write(folder + "/" + name + "n1/size", "2048\n");
+    write(folder + "/" + name + "n1/size", "2000\n");
+    write(folder + "/" + name + "n2/size", "48\n");
     std::filesystem::create_directories(root.path("/sys/class/nvme"));
     std::filesystem::create_directory_symlink(root.path(folder),
                                               root.path("/sys/class/nvme/" + name));
@@ -298,6 +311,8 @@ TEST_F(HealthReaderTest, LeavesReadingsOfAllDrives) {
                                               root.path("/sys/block/" + unit + "/device"));
   }
   write("/sys/block/sda/device/vendor", "ATA\n");  // asleep: `answers` has no data of it
+  write("/sys/block/sda/device/vpd_pg80", std::string("\0\x80\0\4S123", 8));
+  EXPECT_EQ(findDrives(Machine(root))->at(3).serial, "S123");
   ASSERT_TRUE(readAll(1000));
   EXPECT_EQ(log.lines, (Lines{"cannot read the health of ubi1: it reports no health figures"}));
   auto all = readings();
@@ -478,6 +493,8 @@ TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
   std::filesystem::remove(root.path("/sys/class/nvme/nvme0"));
   ASSERT_TRUE(readAll(6000));
   EXPECT_TRUE(readings().empty());
+  ASSERT_TRUE(readAll(6000 + 401 * 86'400));
+  EXPECT_TRUE(decodeMemory(asBytes(contentOf(root.path(kMemoryFile))))->drives.empty());
 }
 
 TEST_F(HealthReaderTest, AKilledReaderTellsNoGrowthTwice) {
