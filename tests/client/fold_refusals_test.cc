@@ -38,7 +38,7 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   const auto file = root / "etc/tavrel/recorders.plist";
   const std::string recorders = R"(<?xml version="1.0" encoding="UTF-8"?><plist version="1.0"><dict>
 <key>12</key><array><string>com.a.</string><string>com.norvane.a.</string><string>com</string></array>
-<key>13</key><array><string>com.a.b.</string></array><key>nobody-here</key><array><string>y</string></array>
+<key>proxy</key><array><string>com.a.b.</string></array><key>nobody-here</key><array><string>y</string></array>
 <key>14</key><string>com.</string></dict></plist>)";
   const Lines keys{"com.a.x", "com.a.b.x", "com.norvane.a.x", "com.norvane.b", "com.b", "x", "y"};
   const std::tuple<std::string, unsigned, uid_t, Lines, std::size_t> cases[] = {
