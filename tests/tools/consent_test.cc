@@ -246,6 +246,7 @@ TEST_F(Consent, ErasesWhereverItIsKilled) {
 
 TEST_F(Consent, ErasesDaysOrAll) {
   device.run("stat import", "scalar\t20000\ta\t1\nscalar\t20001\ta\t1\nvalue\t20001\tb\t5\t0.5\n");
+  device.run("stat import", "scalar\t20002\tc\t1\n");
   const std::string records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/176-2024-10-0";
   for (const char* day : {"4.jsonl", "5.jsonl", "6.jsonl"})
     device.write(records + day, "");
@@ -253,6 +254,16 @@ TEST_F(Consent, ErasesDaysOrAll) {
   for (const char* damaged : {".corrupt-X", "-kept-damaged"})
     device.write(kStore + damaged, "x");
   device.check("erase --key a", fails("not a terminal: add --yes to erase without asking", 2));
+  for (const std::string answer : {"y\n", "yes\n"}) {
+    std::istringstream in(answer);
+    std::ostringstream out, error;
+    ToolStreams streams{in, out, error};
+    streams.inIsTerminal = streams.errorIsTerminal = true;
+    const int status = runTavrelctl({"--root", device.path(""), "erase", "--key", "c"}, streams);
+    EXPECT_EQ(status, answer == "yes\n" ? 0 : 1);
+    EXPECT_TRUE(error.str().starts_with("Erase the statistics whose keys begin with c below " +
+                                        device.path("/") + "? Type yes: "));
+  }
   device.check("erase --yes",
                fails("name what to erase: --all, or --key PREFIX, --from DAY and --to DAY", 2));
   for (const char* more : {" --key a", " --from 1 --to 2"}) {

@@ -52,6 +52,9 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
             std::string::npos)
       << rehearsed;
 
+  EXPECT_NE(device.run("status --check")
+                .out.find("OK folding: 2 segments, 2 statistics with values that wait, for "),
+            std::string::npos);
   const Outcome folded = device.run("stat fold");
   EXPECT_EQ(folded.out, "1 segment: 1 scalar, 2 values; 1 removed\nrefused: 0 values, 1 file\n");
   EXPECT_EQ(folded.error, "tavrelctl: \"x.segment\" in " + folder.string() +

@@ -121,6 +121,14 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
         {"/sys/block/nvme0n1/device", "/sys/devices/nvme-subsys0"}},
        "nvme0c0n1.reads=1 nvme0c0n1.read_merges=2 nvme0c0n1.read_bytes=1536 nvme0n1.reads=4 "
        "nvme0n1.read_merges=5 nvme0n1.read_bytes=3072 disks.read_bytes=1536 "},
+      {{{"/proc/net/dev", "1\n2\neth0: 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16\nbr0: 9\n"},
+        {"/sys/class/net/eth0/device/x", ""}},
+       "eth0.rx_bytes=1 eth0.tx_bytes=9 eth0.rx_packets=2 eth0.rx_errors=3 eth0.rx_dropped=4 "
+       "eth0.rx_fifo_errors=5 eth0.rx_frame_errors=6 eth0.rx_compressed=7 eth0.rx_multicast=8 "
+       "eth0.tx_packets=10 eth0.tx_errors=11 eth0.tx_dropped=12 eth0.tx_fifo_errors=13 "
+       "eth0.tx_collisions=14 eth0.tx_carrier_errors=15 eth0.tx_compressed=16 br0.rx_bytes=9 "
+       "net.rx_bytes=1 net.tx_bytes=9 net.rx_errors=3 net.rx_dropped=4 net.tx_errors=11 "
+       "net.tx_dropped=12 "},
       {{{"/proc/stat",
          "cpu  9 8 7 6 5 4 3 2 1 0\ncpu2 1 2 3 4 5 6 7 8 9 10\nintr 44 1 2\n"
          "ctxt 55\nbtime 1\nprocesses 66\n"}},
@@ -226,6 +234,9 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "sda1.fs_errors=2 fs.errors=2 "},
       {{{"/sys/fs/pstore/dmesg-ramoops-0", ""}, {"/sys/class/watchdog/watchdog0/bootstatus", "32"}},
        "boot.crash_records=1 watchdog0.bootstatus=32 boot.watchdog_status=32 "},
+      {{{"/sys/fs/cgroup/unified/b.slice/cgroup.events", "populated 1\n"},
+        {"/sys/fs/cgroup/unified/b.slice/cpu.stat", "usage_usec 10\n"}},
+       "b.slice.cpu=10 "},
       {{{"/sys/fs/cgroup/cgroup.controllers", "cpu"},
         {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
         {"/sys/fs/cgroup/a.slice/cpu.stat", "usage_usec 10\nnr_throttled 2\n"},
