@@ -8,7 +8,7 @@ namespace {
 // The program's exit status; -1 when there is no such program.
 int statusOf(const std::string& command) {
   const int status = std::system(command.c_str());
-  return WEXITSTATUS(status) == 127 ? -1 : WEXITSTATUS(status);
+  return !WIFEXITED(status) ? 1 : WEXITSTATUS(status) == 127 ? -1 : WEXITSTATUS(status);
 }
 
 std::string linesWith(const std::string& page, std::string_view begin) {
