@@ -1,5 +1,4 @@
 // Base64, ISO dates and hashes.
-#include <bit>
 #include <gtest/gtest.h>
 
 #include "base/base64.h"

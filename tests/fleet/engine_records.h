@@ -4,7 +4,6 @@
 #include <algorithm>
 #include <bit>
 #include <cstring>
-#include <deque>
 #include <map>
 #include <string>
 #include <vector>

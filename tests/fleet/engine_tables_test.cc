@@ -1,5 +1,4 @@
 // The tables as people and other programs see them, and tables spread over several servers.
-#include <gmock/gmock.h>
 #include <sqlite3.h>
 
 #include "fleet/engine/open/open_engine.h"

@@ -1,5 +1,4 @@
 // The exact output of the page's writers.
-#include <cmath>
 #include <gtest/gtest.h>
 #include <limits>
 

@@ -1,6 +1,5 @@
 #include <gtest/gtest.h>
 #include <stdexcept>
-#include <string>
 
 #include "platform/platform_exception.h"
 #include "storage/parse/nand_log_writer.h"

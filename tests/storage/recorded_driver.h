@@ -1,8 +1,6 @@
 // A storage driver whose answers a test defines, and the buffers that it answers with.
 #pragma once
 
-#include <string>
-#include <utility>
 #include <vector>
 
 #include "platform/linux/recorded/recorded_registry.h"

@@ -12,8 +12,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
   const TemporaryDevice device;
   const std::string kNoXmlText =
       "cannot be stored: property lists allow only UTF-8 without control characters: give such "
-      "bytes "
-      "as --plist '{\"$data\": \"BASE64\"}'";
+      "bytes as --plist '{\"$data\": \"BASE64\"}'";
   const std::pair<CommandLine, std::string> kCases[] = {
       {"", "name a subcommand: see 'tavrelctl --help'"},
       {"frob x", "no subcommand 'frob': see 'tavrelctl --help'"},
@@ -67,8 +66,7 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
        "--type: must not be empty: see 'tavrelctl records list --help'"},
       {"records list --type 0x10",
        "--type: give a number up to 4294967295, in decimal digits, not 0x10: see 'tavrelctl "
-       "records "
-       "list --help'"},
+       "records list --help'"},
       {"stat collect --seconds -1",
        "--seconds: give a number up to 4294967295, in decimal digits, not -1: see 'tavrelctl stat "
        "collect --help'"}};

@@ -176,8 +176,7 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
         "'tavrelctl allow' or 'tavrelctl deny'"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
        {"TaskingPayload[0]: contains text that preferences cannot store: property lists contain no "
-        "control "
-        "characters and only UTF-8: give such bytes as data"}}};
+        "control characters and only UTF-8: give such bytes as data"}}};
   for (const auto& [document, findings] : cases) {
     std::string lines;
     for (const std::string& finding : findings)

@@ -1,6 +1,5 @@
 // tavrelctl limits, tavrelctl tidy, and a long queue of logs
 
-#include <sqlite3.h>
 #include <time.h>
 
 #include "base/civil_time.h"

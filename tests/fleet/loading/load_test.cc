@@ -4,7 +4,6 @@
 #include <set>
 #include <sqlite3.h>
 #include <sstream>
-#include <thread>
 
 #include "base/format.h"
 #include "base/text.h"

@@ -1,6 +1,5 @@
 #include "fleet/logs/log_reader.h"
 
-#include <cmath>
 #include <gtest/gtest.h>
 #include <sstream>
 
