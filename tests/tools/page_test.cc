@@ -66,7 +66,11 @@ TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
     import("scalar\t" + std::to_string(today() - recorded) + "\tk\t1\n");
     expect(textOf(), {"Device on " + dayDateText(today() - shown), "k 1 not in it"});
   }
-  expect(textOf("--day 20000 --days 400"), {"Device on 2024-10-04", "Trends over 400 days"});
+  device.write("/proc/uptime", "5\n");
+  for (const char* line : {"0/name POLL", "0/time 25", "1/name C1", "1/time 75"})
+    device.write("/sys/devices/system/cpu/cpu0/cpuidle/state" + std::string(line, 6), line + 7);
+  expect(textOf("--day 20000 --days 400"),
+         {"Device on 2024-10-04", "Trends over 400 days", "POLL 25.0 % 25 µs C1 75.0 % 75 µs"});
 }
 
 TEST_F(PageTest, TellsWhatLeaves) {
