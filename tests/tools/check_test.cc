@@ -286,6 +286,13 @@ TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
              device.path("/etc/tavrel/recorders.plist") +
              ": XML property list, line 1, column 8: no element found; repair or remove it\n",
          1);
+  device.write("/etc/tavrel/recorders.plist", xmlOf(R"({"nosuchuser": ["app."]})"));
+  expect(
+      "WARNING folding: no program records in memory; " +
+          device.path("/etc/tavrel/recorders.plist") +
+          ": the entry \"nosuchuser\" names no user of this machine: until it does, only root may "
+          "record its keys\n",
+      1);
 }
 
 TEST_F(CheckTest, JudgesNothingThatThisUserCannotSee) {

@@ -56,9 +56,10 @@ struct Counter {
   }
 };
 
-struct FirstError final : SystemLog {
-  void write(LogLevel level, std::string_view message) override {
-    if (level == LogLevel::Error && text.empty()) text = message;
+// Of any level: a user who does not exist is only an info, but what such a user records is lost.
+struct FirstLine final : SystemLog {
+  void write(LogLevel, std::string_view message) override {
+    if (text.empty()) text = message;
   }
   std::string text;
 };
@@ -185,7 +186,7 @@ Check foldingCheck(CheckScene& scene, const Recorders& recorders, const SegmentF
 void checkRecording(CheckScene& scene) {
   const DeviceRoot& root = scene.context.root();
   LinuxPlatform& device = scene.context.linuxPlatform();
-  FirstError fault;
+  FirstLine fault;
   const Recorders recorders =
       Recorders::read(root, device.fileSystem(), device.platform().propertyLists, fault);
   const auto folder = SegmentFolder::open(root);
