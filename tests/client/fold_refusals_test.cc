@@ -8,6 +8,7 @@
 #include <dirent.h>
 #include <dlfcn.h>
 #include <fstream>
+#include <pwd.h>
 #include <random>
 #include <sys/resource.h>
 #include <sys/stat.h>
@@ -20,13 +21,23 @@
 
 namespace {
 int readableEntries = INT_MAX;
-}
+int lookUpResult = 0;
+}  // namespace
 
 extern "C" dirent* readdir(DIR* folder) {
   static const auto real = reinterpret_cast<dirent* (*)(DIR*)>(dlsym(RTLD_NEXT, "readdir64"));
   if (readableEntries-- > 0) return real(folder);
   errno = EIO;
   return nullptr;
+}
+
+// Each entry of a user seems long.
+extern "C" int getpwnam_r(const char* name, passwd* entry, char* text, size_t size,
+                          passwd** found) {
+  static const auto real = reinterpret_cast<decltype(&getpwnam_r)>(dlsym(RTLD_NEXT, "getpwnam_r"));
+  *found = nullptr;
+  if (lookUpResult != 0) return lookUpResult;
+  return size < 100'000 ? ERANGE : real(name, entry, text, size, found);
 }
 
 namespace tavrel {
@@ -86,6 +97,25 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
     EXPECT_EQ(taken, expected);
     EXPECT_EQ(scalars.size(), allowed.size() + (refused > 0 ? 1 : 0));
   }
+
+  // Nothing is refused while it is unknown who may record what.
+  std::filesystem::remove(file);
+  std::ofstream(file) << R"(<plist version="1.0"><dict><key>proxy</key><array>
+<string>com.a.</string></array></dict></plist>)";
+  run([] {
+    ASSERT_EQ(setuid(13), 0);
+    BHClientScalarAdd(BHClientScalarForKey("com.a.late"), 2);
+  });
+  lookUpResult = ENFILE;
+  EXPECT_EQ(foldNow().failure,
+            file.string() +
+                " names users who cannot be looked up now; what programs recorded waits "
+                "for the next fold");
+  EXPECT_EQ(log.lines, Lines{file.string() + ": cannot look up the user \"proxy\": Too many "
+                                             "open files in system"});
+  lookUpResult = ENOENT;
+  const FoldReport refusing = foldNow();
+  EXPECT_EQ(refusing.failure.value_or("") + std::to_string(refusing.refused), "1");
 }
 
 TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {

@@ -1,9 +1,9 @@
 #include "platform/linux/folding/recorders.h"
 
 #include <algorithm>
-#include <array>
 #include <cerrno>
 #include <charconv>
+#include <iterator>
 #include <optional>
 #include <pwd.h>
 #include <unistd.h>
@@ -18,21 +18,33 @@ namespace {
 
 constexpr std::string_view kSystemPrefix = "com.norvane.";
 
-std::optional<std::uint32_t> userNumber(std::string_view user) {
+constexpr std::size_t kShownBytes = 60;          // of a user's name
+constexpr std::size_t kLongestEntry = 1U << 20;  // of the table of users, in bytes
+
+// Why it is unknown whether a user exists. Name services have other codes for "no".
+constexpr int kObstacles[] = {EAGAIN, EINTR, EIO, EMFILE, ENFILE, ENOMEM, ERANGE};
+
+// Nothing when there is no such user.
+Expected<std::optional<std::uint32_t>> userNumber(std::string_view user) {
   std::uint32_t number = 0;
   const char* const end = user.data() + user.size();
   if (const auto [stop, error] = std::from_chars(user.data(), end, number);
       error == std::errc{} && stop == end) {
-    return number;
+    return std::optional(number);
   }
-  std::array<char, 4096> text;
+  const std::string name(user);
+  std::string text;
   passwd entry{};
   passwd* found = nullptr;
-  if (getpwnam_r(std::string(user).c_str(), &entry, text.data(), text.size(), &found) != 0 ||
-      found == nullptr) {
-    return std::nullopt;
+  int code = ERANGE;
+  for (std::size_t size = 4096; code == ERANGE && size <= kLongestEntry; size *= 2) {
+    text.resize(size);
+    code = getpwnam_r(name.c_str(), &entry, text.data(), text.size(), &found);
   }
-  return found->pw_uid;
+  if (std::ranges::find(kObstacles, code) != std::end(kObstacles)) {
+    return systemError("look up the user", quotedText(user.substr(0, kShownBytes)), code);
+  }
+  return found == nullptr ? std::nullopt : std::optional<std::uint32_t>(found->pw_uid);
 }
 
 }  // namespace
@@ -66,7 +78,7 @@ Recorders Recorders::read(const DeviceRoot& root, FileSystem& files,
 void Recorders::add(std::string_view user, const plist::Value& prefixes, const std::string& path,
                     SystemLog& log) {
   const auto complain = [&](std::string_view what, LogLevel level = LogLevel::Error) {
-    log.log(level, "%s: the entry %s %s", path, quotedText(user.substr(0, 60)), what);
+    log.log(level, "%s: the entry %s %s", path, quotedText(user.substr(0, kShownBytes)), what);
   };
   const plist::Array array = prefixes.array();
   if (!array) return complain("is ignored: give an array of prefixes");
@@ -76,9 +88,13 @@ void Recorders::add(std::string_view user, const plist::Value& prefixes, const s
   });
   if (!areGood) return complain("is ignored: a prefix is a text of 1 to 1024 bytes");
   // Some users exist only while their service runs. In between, nobody may take their keys.
-  const auto number = userNumber(user);
+  const auto found = userNumber(user);
+  const auto number = found ? *found : std::nullopt;
   if (number) {
     listed_.insert(*number);
+  } else if (!found) {
+    areUsersKnown_ = false;
+    log.write(LogLevel::Error, path + ": " + found.error().message);
   } else {
     // A fold each hour must not fill the journal with it.
     complain("names no user of this machine: until it does, only root may record its keys",

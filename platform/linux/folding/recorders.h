@@ -35,11 +35,15 @@ class Recorders {
 
   /// Reads `kRecordersFile`. A file that is damaged, that users other than root and this user could
   /// have written, or that is a dangling link counts as absent, and so does an entry without an
-  /// array of prefixes. Each of these, and each user that does not exist, is a line in the log.
+  /// array of prefixes. Each of these, and each user who does not exist or cannot be looked up, is
+  /// a line in the log.
   static Recorders read(const DeviceRoot& root, FileSystem& files,
                         PropertyListCoding& propertyLists, SystemLog& log);
 
   bool mayRecord(std::uint32_t user, std::string_view key) const;
+
+  /// False when a user could not be looked up: then a "no" may be wrong.
+  bool areUsersKnown() const { return areUsersKnown_; }
 
  private:
   void add(std::string_view user, const plist::Value& prefixes, const std::string& path,
@@ -50,6 +54,7 @@ class Recorders {
 
   Users users_;
   std::set<std::uint32_t> listed_;
+  bool areUsersKnown_ = true;
 };
 
 }  // namespace tavrel

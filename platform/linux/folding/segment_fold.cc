@@ -391,8 +391,11 @@ FoldReport SegmentFold::run() {
     const std::int64_t most = bounds
                                   ? bounds->of(Kept::Store).bytes / 100 * limits::kFoldStorePercent
                                   : std::numeric_limits<std::int64_t>::max();
-    if (const Status done = foldAll(**folder, store_, *notes, recorders, report, most, *listing);
-        !done) {
+    const Status done =
+        recorders.areUsersKnown()
+            ? foldAll(**folder, store_, *notes, recorders, report, most, *listing)
+            : Error{root_.path(kRecordersFile) + " names users who cannot be looked up now"};
+    if (!done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
     }
   }
