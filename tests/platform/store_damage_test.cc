@@ -211,6 +211,7 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
         EXPECT_EQ(contentOf(store_->path()), content);
       }
       if (!byReader) {
+        if (damaged) store_ = open();
         EXPECT_EQ(hasAllRows(), !reason) << "which the checkpoint has found out";
       }
       EXPECT_TRUE(store_->commit()) << "or kept";
@@ -246,6 +247,43 @@ TEST_F(StoreTest, SetsAsideWhatSqliteFindsDamagedAndNothingElse) {
     EXPECT_EQ(log.lines, Lines{where() + what + ": move it away"});
   }
   EXPECT_EQ(contentOf(elsewhere), "");
+}
+
+TEST_F(StoreTest, ADamagedStoreLeavesDaysIncomplete) {
+  constexpr std::int64_t kNone = kSmallest;
+  constexpr const char* kUnset = "19700101T000012Z";
+  const std::tuple<std::string, std::int64_t, std::int64_t> cases[] = {
+      {"20261125T235959Z", kToday - 9, kToday - 2},
+      {"20261127T000000Z.1", kToday - 9, kToday},
+      {kUnset, 0, 0},
+      {kUnset, kToday - 1, kToday - 1},  // the clock was not set yet
+      {"20991231T000000Z", kToday - 3, kToday - 3},
+      {"20991231T000000Z", kToday + 1, kNone},  // it was ahead
+      {"20261127T000000Z-wal", kToday, kNone}};
+  set({{"k", kToday, 1}});
+  for (const auto& [ending, changed, last] : cases) {
+    SCOPED_TRACE(ending);
+    const std::string aside = store_->path() + ".corrupt-" + ending;
+    std::ofstream(aside).close();
+    const timespec time{changed * 86'400, 0};
+    const timespec times[] = {time, time};
+    utimensat(AT_FDCWD, aside.c_str(), times, 0);
+    store_ = open();
+    log.lines.clear();
+    const auto history = store_->initWithDefaultPath();
+    const auto isWhole = [&](std::int64_t day) {
+      return history->scalarsForKeyPrefix("", day - 1, day, [](auto, auto, auto, auto&) {}) &&
+             history->distributionsForKeyPrefix("", day - 1, day, [](auto, auto, auto&, auto&) {});
+    };
+    EXPECT_TRUE(isWhole(last == kNone ? kSmallest + 1 : last + 1));
+    EXPECT_EQ(log.lines, Lines{});
+    if (last != kNone) {
+      EXPECT_FALSE(isWhole(last) || isWhole(last - 100));
+      EXPECT_EQ(log.lines, Lines{where() + "rows may be missing: they were in " + aside +
+                                 ", which is damaged: inspect or remove that file"});
+    }
+    std::filesystem::remove(aside);
+  }
 }
 
 /// During its lifetime, one read of SQLite fails, or that one and all later ones.

@@ -51,6 +51,17 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   EXPECT_NE(rehearsed.out.find(format("reads scalars of day %d: 1 row\n", today())),
             std::string::npos)
       << rehearsed;
+  const std::string aside =
+      device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x");
+  device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x", "");
+  const Outcome part = device.run("log preview --day today");
+  EXPECT_TRUE(part.status == 1 &&
+              part.error.ends_with(": rows may be missing: they were in " + aside +
+                                   ", which is damaged: inspect or remove that file\n"))
+      << part;
+  EXPECT_NE(device.run("rehearse --today").out.find(" without statistics that could not be read"),
+            std::string::npos);
+  std::filesystem::remove(aside);
 
   EXPECT_NE(device.run("status --check")
                 .out.find("OK folding: 2 segments, 2 statistics with values that wait, for "),

@@ -214,6 +214,7 @@ class Mishaps(Life):
         size = self.device.path(STORE).stat().st_size
         self.device.write(STORE, self.chance.randbytes(size))
         self.model.corruptions += 1
+        self.model.last_lost = self.clock.today
         self.fold()
         self.check_new_store(self.model.stored)
         return True

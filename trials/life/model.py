@@ -13,6 +13,7 @@ DA = "com.norvane.da"
 OTHER = "com.example.settings"  # a domain of another program
 CAPACITY = 32 << 30
 NAND_PERIOD = 7 * SECONDS_PER_DAY
+IN_PART = {"filed": "filed-in-part", "nothing-to-report": "store-unreadable"}
 REPORTED = ("reported", "filed by hand")  # fates that another run does not change
 LANGUAGES = b"en\nde\nzh-Hant\n"  # the languages that the device shows
 LOCALES = [  # /etc/locale.conf, and what a log says about it
@@ -111,6 +112,7 @@ class Model:
         self.domains = {DA: {}, OTHER: {}}  # what a tasking has set
         self.scheduled = None
         self.corruptions = 0
+        self.last_lost = None               # the last day of which a damaged store had values
         self.last_nand = None
         self.events, self.records = [], {}  # memory errors that wait, and those filed, by day
         self.fates = {}                     # what became of each day
@@ -237,6 +239,8 @@ class Model:
             self.first_day = None
         log = self.log(day, clock)
         effects["outcome"] = log if isinstance(log, str) else "filed"
+        if self.last_lost is not None and day <= self.last_lost <= clock.today:
+            effects["outcome"] = IN_PART.get(effects["outcome"], effects["outcome"])
         if not isinstance(log, str):
             effects["log"], effects["metadata"] = log, self.metadata(clock)
             if self.options("Scalar", "com.norvane.zentrix.bhd.database.corruptions") is not None:

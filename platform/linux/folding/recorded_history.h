@@ -29,6 +29,9 @@ class RecordedHistory {
   Status walkScalars(const BHHistory::ScalarRowHandler& rowHandler);
   Status walkDistributions(const SqliteHistory::CountedRowHandler& rowHandler);
 
+  /// False when the store lacks rows of days after `dayBefore`; the system log has the reason.
+  bool isStoreComplete(std::int64_t dayBefore) { return stored_ && stored_->isComplete(dayBefore); }
+
   /// The first and the last day with a row, selected or not; nothing when there is none.
   Expected<std::optional<SqliteHistory::DaySpan>> daysHeld();
 

@@ -59,14 +59,14 @@ class UnfoldedStore::History final : public BHHistory {
       return false;
     }
     rows_ = *std::move(rows);
-    lacksStore_ = rows_->storeFault().has_value();
-    if (lacksStore_) store_.log_.write(LogLevel::Error, rows_->storeFault()->message);
+    lacksRows_ = !rows_->isStoreComplete(before);
+    if (rows_->storeFault()) store_.log_.write(LogLevel::Error, rows_->storeFault()->message);
     store_.missing_.insert(store_.missing_.end(), rows_->missingValues().begin(),
                            rows_->missingValues().end());
     return true;
   }
 
-  bool isComplete() const { return !hasFailed_ && !lacksStore_; }
+  bool isComplete() const { return !hasFailed_ && !lacksRows_; }
 
   void fail(const Error& error) {
     hasFailed_ = true;
@@ -78,7 +78,7 @@ class UnfoldedStore::History final : public BHHistory {
   RowSelection selection_;
   std::optional<RecordedHistory> rows_;
   bool hasFailed_ = false;
-  bool lacksStore_ = false;
+  bool lacksRows_ = false;
 };
 
 std::unique_ptr<BHHistory> UnfoldedStore::initWithDefaultPath() {

@@ -147,14 +147,14 @@ bool SqliteHistory::scalarsForKeyPrefix(std::string_view prefix, std::int64_t mi
     report(failure);
     return false;
   }
-  return !isIncomplete_;
+  return isComplete(minDaysSince1970);
 }
 
 bool SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                                               std::int64_t minDaysSince1970,
                                               std::int64_t maxDaysSince1970,
                                               const DistributionRowHandler& rowHandler) {
-  bool isComplete = !isIncomplete_;
+  bool isWhole = true;
   try {
     readUnchanged([&] {
       readDistributions(
@@ -164,14 +164,22 @@ bool SqliteHistory::distributionsForKeyPrefix(std::string_view prefix,
                         bool& stop) { rowHandler(key, day, values, stop); },
           [&](const StoreFailure& failure) {
             site_.logFailure(failure);
-            isComplete = false;
+            isWhole = false;
           });
     });
   } catch (const StoreFailure& failure) {
     report(failure);
     return false;
   }
-  return isComplete;
+  return isComplete(minDaysSince1970) && isWhole;
+}
+
+bool SqliteHistory::isComplete(std::int64_t dayBefore) {
+  if (isIncomplete_) return false;
+  if (!loss_) loss_ = site_.lastLoss();
+  if (dayBefore >= loss_->lastDay) return true;
+  site_.logFailure(loss_->failure);
+  return false;
 }
 
 // Data read without locks is valid only if nobody has written in the meantime.

@@ -35,6 +35,10 @@ class SqliteHistory : public BHHistory {
   /// From now on each query says that rows are missing.
   void setIncomplete() { isIncomplete_ = true; }
 
+  /// False when rows of days after `dayBefore` are missing, here or because a damaged store has
+  /// taken them with it; the system log has the reason.
+  bool isComplete(std::int64_t dayBefore);
+
   bool scalarsForKeyPrefix(std::string_view prefix, std::int64_t minDaysSince1970,
                            std::int64_t maxDaysSince1970,
                            const ScalarRowHandler& rowHandler) override;
@@ -114,6 +118,7 @@ class SqliteHistory : public BHHistory {
   std::optional<FileIdentity> identity_;
   std::optional<ReadableStore> store_;
   bool isIncomplete_ = false;
+  std::optional<StoreLoss> loss_;          // once it is known
   std::int64_t version_ = kSchemaVersion;  // as it was when the query began
 };
 

@@ -6,6 +6,8 @@
 #include <unistd.h>
 
 #include "base/arithmetic.h"
+#include "base/civil_time.h"
+#include "base/format.h"
 #include "base/system_text.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/stamp.h"
@@ -19,6 +21,8 @@ std::string folderOf(const std::string& path) {
   return path.substr(0, path.rfind('/'));
 }
 
+constexpr std::string_view kSetAsideMark = ".corrupt-";
+
 // A name for which neither the file nor its log files exist yet.
 std::string freeName(const std::string& wanted) {
   std::string name = wanted;
@@ -26,6 +30,21 @@ std::string freeName(const std::string& wanted) {
     name = wanted + "." + std::to_string(attempt);
   }
   return name;
+}
+
+// Of a store that was set aside and keeps the name `file`.
+StoreFailure lossOf(const std::string& file) {
+  return {StoreFault::Damaged, "rows may be missing: they were in " + file +
+                                   ", which is damaged: inspect or remove that file"};
+}
+
+// The day in the name of a store that was set aside, from its stamp, "YYYYMMDDT...".
+std::optional<std::int64_t> dayInStamp(std::string_view stamp) {
+  constexpr std::size_t kDateDigits = 8;
+  if (stamp.size() <= kDateDigits || stamp[kDateDigits] != 'T') return std::nullopt;
+  const auto date =
+      parseDate(format("%s-%s-%s", stamp.substr(0, 4), stamp.substr(4, 2), stamp.substr(6, 2)));
+  return date ? std::optional(daysFromCivil(*date)) : std::nullopt;
 }
 
 bool moveFile(const std::string& from, const std::string& to) {
@@ -95,7 +114,8 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
     const StoreFolderLock lock(path, *busy);
     if (FileIdentity::of(path) != damaged) return std::nullopt;
     withholdFromOthers(path);
-    const std::string name = freeName(path + ".corrupt-" + compactStamp(clock.now()));
+    const std::string name =
+        freeName(path + std::string(kSetAsideMark) + compactStamp(clock.now()));
     // The log goes first. If the process is killed in between, the file is found damaged again; a
     // log left without its file would be taken for that of a new store.
     if (!moveFile(path + "-wal", name + "-wal") || !moveFile(path + "-shm", name + "-shm") ||
@@ -104,6 +124,7 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
                                                   systemText(errno) +
                                                   ": run as the owner of its folder"};
     }
+    logged->insert(lossOf(name).message);
     log.write(LogLevel::Error, describe(failure) + "; it is now " + name +
                                    " and a new store begins: inspect or remove that file");
   } catch (const StoreFailure& obstacle) {
@@ -115,6 +136,28 @@ std::optional<StoreFailure> StoreSite::setAside(const std::optional<FileIdentity
                                      kStoreCorruptionsDomain);
   preferences.ZTXPreferencesSynchronize(kStoreCorruptionsDomain);
   return std::nullopt;
+}
+
+StoreLoss StoreSite::lastLoss() const {
+  const std::string folder = folderOf(path);
+  const auto names = FileSystem().list(folder);
+  if (!names) return {INT64_MAX, {StoreFault::Refused, names.error().message}};
+  const std::string beginning = path.substr(folder.size() + 1) + std::string(kSetAsideMark);
+  const std::int64_t today = dayOf(clock.now());
+  StoreLoss last{INT64_MIN, {StoreFault::Damaged, {}}};
+  for (const std::string& name : *names) {
+    if (!name.starts_with(beginning) || name.ends_with("-wal") || name.ends_with("-shm")) continue;
+    const std::string file = folder + '/' + name;
+    const auto status = FileSystem::status(file);
+    // The clock may have been wrong when it was set aside or when it was last changed.
+    const std::optional<std::int64_t> days[] = {
+        dayInStamp(std::string_view(name).substr(beginning.size())),
+        status ? std::optional(dayOfSecond(status->st_mtim.tv_sec)) : std::nullopt};
+    for (const auto& day : days) {
+      if (day && *day <= today && *day >= last.lastDay) last = {*day, lossOf(file)};
+    }
+  }
+  return last;
 }
 
 }  // namespace tavrel

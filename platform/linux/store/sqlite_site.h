@@ -54,6 +54,12 @@ class StoreFolderLock {
   Descriptor descriptor_;
 };
 
+/// The rows that a damaged store took with it when it was set aside.
+struct StoreLoss {
+  std::int64_t lastDay;  // in UTC; before all days when there was none
+  StoreFailure failure;  // why the rows are missing
+};
+
 /// The store's path, and the services to which failures are reported, which must outlive it.
 struct StoreSite {
   std::string path;
@@ -89,6 +95,11 @@ struct StoreSite {
   /// could not be moved. No connection to the store may be open.
   std::optional<StoreFailure> setAside(const std::optional<FileIdentity>& damaged,
                                        const StoreFailure& failure) const;
+
+  /// What the latest of the stores took that were set aside, by any process, and are still there.
+  /// It had rows of days up to its last change or to when it was set aside, whichever is later and
+  /// not after today. When they cannot be listed, rows of any day may be missing.
+  StoreLoss lastLoss() const;
 };
 
 }  // namespace tavrel

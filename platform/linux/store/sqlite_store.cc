@@ -76,7 +76,6 @@ std::optional<StoreFailure> SqliteStore::attempt(Operation operation) {
     } catch (const StoreFailure& failure) {
       if (failure.fault != StoreFault::Damaged || again) return failure;
       if (auto obstacle = site_.setAside(identity, failure)) return obstacle;
-      hasLostRows_ = true;
     }
   }
 }
@@ -200,11 +199,11 @@ std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
   if (failure) {
     site_.logFailure(*failure);
     history = std::make_unique<SqliteHistory>(site_, std::nullopt, std::nullopt);
+    history->setIncomplete();
   } else if (!history->hasStore()) {
     site_.log.write(LogLevel::Info,
                     site_.describe({StoreFault::Other, "nothing has been recorded yet"}));
   }
-  if (failure || hasLostRows_) history->setIncomplete();
   return history;
 }
 
@@ -231,7 +230,6 @@ Status SqliteStore::replaceDamaged(std::unique_ptr<SqliteBatch> batch, const Err
   if (const auto obstacle = site_.setAside(damage->file, damage->failure)) {
     return Error{site_.describe(*obstacle)};
   }
-  hasLostRows_ = true;
   return Done{};
 }
 

@@ -94,7 +94,6 @@ class SqliteStore : public StatisticsStore {
   std::optional<StoreFailure> attempt(Operation operation);
 
   StoreSite site_;
-  bool hasLostRows_ = false;  // a damaged store was set aside
   // By day and key.
   std::map<std::pair<std::int32_t, std::string>, std::int64_t> pending_;
 };
