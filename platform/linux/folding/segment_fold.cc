@@ -79,6 +79,8 @@ class FoldRun {
   void logLimit(std::uint32_t owner, std::string_view limit);
   bool isStoreFull() const;
   void finishSegments();
+  /// The refused files that this fold counts: none while there is no day to count them under.
+  std::uint64_t filesToCount() const { return boot_ ? notes_.uncountedFiles() : 0; }
 
   const SegmentFolder& folder_;
   SqliteStore& store_;
@@ -115,7 +117,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
     notes_.refuse(line);
-  if (listing.segments.empty() && notes_.uncountedFiles() == 0) return Done{};
+  if (listing.segments.empty() && filesToCount() == 0) return Done{};
   do {
     auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
@@ -160,7 +162,7 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
   const std::pair<const char*, std::uint64_t> figures[] = {
       {"com.norvane.brimhold.dropped", counts_.dropped},
       {"com.norvane.brimhold.refused", counts_.refused},
-      {"com.norvane.brimhold.segments_refused", notes_.uncountedFiles()},
+      {"com.norvane.brimhold.segments_refused", filesToCount()},
   };
   ScalarChanges own;
   for (const auto& [key, count] : figures) {
@@ -345,8 +347,8 @@ void FoldRun::finishSegments() {
   report_.removed += counts_.removed;
   report_.dropped += counts_.dropped;
   report_.refused += counts_.refused;
-  report_.segmentsRefused += notes_.uncountedFiles();
-  notes_.clearUncountedFiles();
+  report_.segmentsRefused += filesToCount();
+  if (boot_) notes_.clearUncountedFiles();
   counts_ = {};
 }
 
