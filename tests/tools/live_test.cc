@@ -182,7 +182,13 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
          "     From  :   To\n           : 200000000 400000000   time(ms)\n"
          "*  200000000:         0         3       12\n   400000000:         2         0       34\n"
          "Total transition : 5\n"},
-        {"/sys/class/devfreq/gpu/cur_freq", "200000000"}},
+        {"/sys/class/devfreq/gpu/cur_freq", "200000000"},
+        // These lack a row, or the end of one: transitions would count as times.
+        {"/sys/class/devfreq/dmc/trans_stat",
+         "  From  :  To\n   :  2000  4000  6000  time(ms)\n  2000:  0  3  4  12\n"
+         "  4000:  2  0  5  34\n"},
+        {"/sys/class/devfreq/npu/trans_stat",
+         "  From  :  To\n   :  2000  4000  time(ms)\n  2000:  0  3  12\n  4000:  2  0  3"}},
        "gpu.frequency=200MHz:2/12* 400MHz:3/34  "},
       // Without the whole table of transitions, the entries are unknown, not 0 or too low.
       {{{kCpu + "cpufreq/policy0/stats/time_in_state", "3000 1\n2000 2\n1000 3\n"},

@@ -33,6 +33,24 @@ std::vector<std::string> numberedRows(const std::string& path, const TableForm& 
   return keys;
 }
 
+// Whether a text that has transitions and times in each row lacks rows, for which the others have
+// entries, or the end of the last one. The kernel cuts a large table to one page.
+bool isCutTable(const std::string& path, const std::vector<std::string>& states,
+                const TableForm& form) {
+  TextBuffer buffer;
+  auto text = readKernelFile(path, ReadMode::Once, buffer);
+  if (!text || !text->ends_with('\n')) return true;
+  while (!text->empty()) {
+    std::string_view line = takeLine(*text);
+    if (!parseNumber(keyOfLine(line, form))) continue;
+    std::size_t tokens = 0;
+    while (!takeToken(line, form.separator).empty())
+      ++tokens;
+    if (tokens > states.size() + 1) return true;
+  }
+  return false;
+}
+
 // A table "FROM: ENTRIES OF STATE 0, OF STATE 1 ..." whose rows add up to the entries of states.
 // The kernel cuts a large table to one page: sums of a part would be too low.
 class TransitionReader final : public TextReader {
@@ -85,6 +103,8 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
                    LiveSource& source) {
   const std::vector<std::string> states = numberedRows(table.times, table.form);
   if (states.empty()) return;
+  // Its transitions would count as times.
+  if (table.timeIsLast && isCutTable(table.times, states, table.form)) return;
   Residency residency;
   std::vector<std::string> names;
   for (const std::string& state : states) {
