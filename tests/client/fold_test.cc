@@ -244,6 +244,21 @@ TEST_F(FoldTest, WaitsMinutesForAnotherFold) {
   EXPECT_EQ(scalar("count"), 7);
 }
 
+TEST_F(FoldTest, AReportAfterAFailedFoldIsIncomplete) {
+  run([] { add(7); });
+  const auto lock = root / "run/tavrel/fold.lock";
+  std::filesystem::create_directories(lock);
+  LinuxPlatform device(DeviceRoot(root), {.log = &log});
+  StatisticsStore& statistics = device.platform().statistics;
+  for (const bool isFolded : {false, true}) {
+    if (isFolded) std::filesystem::remove(lock);
+    statistics.BHClientCheckpoint();
+    EXPECT_EQ(statistics.initWithDefaultPath()->scalarsForKeyPrefix("", kToday - 1, kToday,
+                                                                    [](auto, auto, auto, auto&) {}),
+              isFolded);
+  }
+}
+
 TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
   const pid_t child = start([] {
     for (int round = 0; round < 3; ++round) {

@@ -7,6 +7,7 @@
 #include <string_view>
 
 #include "platform/linux/folding/segment_fold.h"
+#include "platform/linux/store/sqlite_store.h"
 #include "platform/statistics_store.h"
 #include "platform/system_log.h"
 
@@ -15,7 +16,7 @@ namespace tavrel {
 class FoldingStore final : public StatisticsStore {
  public:
   /// All must outlive it.
-  FoldingStore(StatisticsStore& store, SegmentFold& fold, SystemLog& log)
+  FoldingStore(SqliteStore& store, SegmentFold& fold, SystemLog& log)
       : store_(store), fold_(fold), log_(log) {}
 
   std::int32_t BHDaysSince1970() override { return store_.BHDaysSince1970(); }
@@ -27,12 +28,14 @@ class FoldingStore final : public StatisticsStore {
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
     store_.BHClientSetValueForScalarKey(key, value);
   }
-  std::unique_ptr<BHHistory> initWithDefaultPath() override { return store_.initWithDefaultPath(); }
+  /// After a failed fold, its queries say that rows are missing: those of the segments.
+  std::unique_ptr<BHHistory> initWithDefaultPath() override;
 
  private:
-  StatisticsStore& store_;
+  SqliteStore& store_;
   SegmentFold& fold_;
   SystemLog& log_;
+  bool isFolded_ = true;
   std::string toldFailure_;
 };
 

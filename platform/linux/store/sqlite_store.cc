@@ -193,7 +193,7 @@ std::unique_ptr<SqliteHistory> SqliteStore::openForReading(
       site_, identity, openStoreForReading(site_.path, site_.busy, site_.changesNothing));
 }
 
-std::unique_ptr<BHHistory> SqliteStore::initWithDefaultPath() {
+std::unique_ptr<SqliteHistory> SqliteStore::openOrReport() {
   std::unique_ptr<SqliteHistory> history;
   const auto failure = attempt([&](const auto& identity) { history = openForReading(identity); });
   if (failure) {

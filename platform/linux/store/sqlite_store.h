@@ -51,7 +51,7 @@ class SqliteStore : public StatisticsStore {
   /// stays; a line says so, and the next checkpoint moves it.
   bool BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
-  std::unique_ptr<BHHistory> initWithDefaultPath() override;
+  std::unique_ptr<BHHistory> initWithDefaultPath() override { return openOrReport(); }
 
   /// Commits the values set so far and the kept ones. False when values remain in memory only.
   bool commit();
@@ -69,6 +69,9 @@ class SqliteStore : public StatisticsStore {
 
   /// Opens the store to remove days; null when there is none.
   Expected<std::unique_ptr<SqliteTrim>> beginTrim();
+
+  /// The history that `initWithDefaultPath` returns.
+  std::unique_ptr<SqliteHistory> openOrReport();
 
   /// The history with its wider set of queries; without rows when there is no store yet.
   Expected<std::unique_ptr<SqliteHistory>> openHistory();
