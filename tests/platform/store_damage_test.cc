@@ -253,9 +253,9 @@ TEST_F(StoreTest, ADamagedStoreLeavesDaysIncomplete) {
   constexpr std::int64_t kNone = kSmallest;
   constexpr const char* kUnset = "19700101T000012Z";
   const std::tuple<std::string, std::int64_t, std::int64_t> cases[] = {
-      {"20261125T235959Z", kToday - 9, kToday - 2},
+      {"20261125T235959Z", kToday, kToday - 2},  // somebody has inspected it
       {"20261127T000000Z.1", kToday - 9, kToday},
-      {kUnset, 0, 0},
+      {kUnset, 0, kNone},
       {kUnset, kToday - 1, kToday - 1},  // the clock was not set yet
       {"20991231T000000Z", kToday - 3, kToday - 3},
       {"20991231T000000Z", kToday + 1, kNone},  // it was ahead

@@ -22,6 +22,8 @@ std::string folderOf(const std::string& path) {
 }
 
 constexpr std::string_view kSetAsideMark = ".corrupt-";
+// 2020-01-01: clocks that were never set begin earlier.
+constexpr std::int64_t kFirstPlausibleDay = 18262;
 
 // A name for which neither the file nor its log files exist yet.
 std::string freeName(const std::string& wanted) {
@@ -148,14 +150,17 @@ StoreLoss StoreSite::lastLoss() const {
   for (const std::string& name : *names) {
     if (!name.starts_with(beginning) || name.ends_with("-wal") || name.ends_with("-shm")) continue;
     const std::string file = folder + '/' + name;
-    const auto status = FileSystem::status(file);
-    // The clock may have been wrong when it was set aside or when it was last changed.
-    const std::optional<std::int64_t> days[] = {
-        dayInStamp(std::string_view(name).substr(beginning.size())),
-        status ? std::optional(dayOfSecond(status->st_mtim.tv_sec)) : std::nullopt};
-    for (const auto& day : days) {
-      if (day && *day <= today && *day >= last.lastDay) last = {*day, lossOf(file)};
+    const auto isPlausible = [&](const std::optional<std::int64_t>& day) {
+      return day && *day >= kFirstPlausibleDay && *day <= today;
+    };
+    std::optional<std::int64_t> day = dayInStamp(std::string_view(name).substr(beginning.size()));
+    if (!isPlausible(day)) {
+      // The clock was wrong when it was set aside. Whoever inspects or copies the file may change
+      // its time, so that is only second best.
+      const auto status = FileSystem::status(file);
+      if (status) day = dayOfSecond(status->st_mtim.tv_sec);
     }
+    if (isPlausible(day) && *day >= last.lastDay) last = {*day, lossOf(file)};
   }
   return last;
 }
