@@ -1,5 +1,6 @@
 #include "daemon/tasking.h"
 
+#include <cstdlib>
 #include <set>
 #include <string>
 
