@@ -126,6 +126,11 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
         std::to_string(leftOut) +
         " segments with values that wait are not shown: run 'tavrelctl stat fold'");
   }
+  if (!recorders.areUsersKnown()) {
+    history.missingValues_.push_back(root.path(kRecordersFile) +
+                                     " names users who cannot be looked up now: what users other "
+                                     "than root recorded may not be shown");
+  }
   if (isOvertaken) {
     history.missingValues_.emplace_back(
         "folds took values during each attempt to read them, and some are not shown: run it again");

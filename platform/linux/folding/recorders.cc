@@ -39,6 +39,7 @@ Expected<std::optional<std::uint32_t>> userNumber(std::string_view user) {
   int code = ERANGE;
   for (std::size_t size = 4096; code == ERANGE && size <= kLongestEntry; size *= 2) {
     text.resize(size);
+    errno = 0;  // without a name service, getpwnam_r returns what it was before
     code = getpwnam_r(name.c_str(), &entry, text.data(), text.size(), &found);
   }
   if (std::ranges::find(kObstacles, code) != std::end(kObstacles)) {

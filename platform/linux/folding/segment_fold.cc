@@ -216,6 +216,7 @@ bool FoldRun::isStoreFull() const {
 }
 
 bool FoldRun::admit(const SegmentName& name) {
+  if (name.owner != 0 && !recorders_.areUsersKnown()) return false;
   if (name.owner != 0 && isStoreFull()) {
     notes_.logOnce(
         "the statistics store is far beyond its limit: what users other than root record waits "
@@ -393,12 +394,13 @@ FoldReport SegmentFold::run() {
     const std::int64_t most = bounds
                                   ? bounds->of(Kept::Store).bytes / 100 * limits::kFoldStorePercent
                                   : std::numeric_limits<std::int64_t>::max();
-    const Status done =
-        recorders.areUsersKnown()
-            ? foldAll(**folder, store_, *notes, recorders, report, most, *listing)
-            : Error{root_.path(kRecordersFile) + " names users who cannot be looked up now"};
+    const Status done = foldAll(**folder, store_, *notes, recorders, report, most, *listing);
     if (!done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
+    } else if (!recorders.areUsersKnown()) {
+      report.failure = root_.path(kRecordersFile) +
+                       " names users who cannot be looked up now; what users other than root "
+                       "recorded waits for the next fold";
     }
   }
   notes->save();
