@@ -180,16 +180,22 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "policy0.frequency=1800MHz:8/30 600500k:7/40*  policy0.frequency_changes=15 "},
       {{{"/sys/class/devfreq/gpu/trans_stat",
          "     From  :   To\n           : 200000000 400000000   time(ms)\n"
-         "*  200000000:         0         3       12\n   400000000:         2         0       34\n"
-         "Total transition : 5\n"},
+         "*  200000000:         042949672951234567890\n"
+         "   400000000:         2         012345678901\nTotal transition : 5\n"},
         {"/sys/class/devfreq/gpu/cur_freq", "200000000"},
-        // These lack a row, or the end of one: transitions would count as times.
-        {"/sys/class/devfreq/dmc/trans_stat",
-         "  From  :  To\n   :  2000  4000  6000  time(ms)\n  2000:  0  3  4  12\n"
-         "  4000:  2  0  5  34\n"},
-        {"/sys/class/devfreq/npu/trans_stat",
-         "  From  :  To\n   :  2000  4000  time(ms)\n  2000:  0  3  12\n  4000:  2  0  3"}},
-       "gpu.frequency=200MHz:2/12* 400MHz:3/34  "},
+        {"/sys/class/devfreq/bus/trans_stat", "2000:  0  3  12\n*4000:  2  0  34\nTotal : 5\n"},
+        // A row is missing, in which case transitions look like times; the others have an entry too
+        // many, a last field that is too short, and fields of 12 characters.
+        {"/sys/class/devfreq/cut/trans_stat",
+         "2000:         0         3         41234567890\n"
+         "4000:         2         0         51234567890\n"},
+        {"/sys/class/devfreq/long/trans_stat", "2000:  0  3  12\n4000:  2  0  3  4\nTotal : 5\n"},
+        {"/sys/class/devfreq/short/trans_stat",
+         "2000:  0  3  12\n4000:         2123456789034\nTotal : 5\n"},
+        {"/sys/class/devfreq/wide/trans_stat",
+         "2000:  0  3  12\n4000:         123         4561234567890\nTotal : 5\n"}},
+       "bus.frequency=2k:2/12 4k:3/34  gpu.frequency=200MHz:2/1234567890* "
+       "400MHz:4294967295/12345678901  "},
       // Without the whole table of transitions, the entries are unknown, not 0 or too low.
       {{{kCpu + "cpufreq/policy0/stats/time_in_state", "3000 1\n2000 2\n1000 3\n"},
         {kCpu + "cpufreq/policy0/stats/trans_table",

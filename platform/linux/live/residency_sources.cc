@@ -1,14 +1,12 @@
 // Sources of residencies: how long a device was in each of its states, and how often it entered
 // them.
 #include <algorithm>
-#include <functional>
 #include <memory>
 #include <string>
-#include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "base/ascii.h"
-#include "base/keyed_hash.h"
 #include "base/limits.h"
 #include "platform/linux/live/attribute_class.h"
 #include "platform/linux/live/sources.h"
@@ -33,55 +31,59 @@ std::vector<std::string> numberedRows(const std::string& path, const TableForm& 
   return keys;
 }
 
-// Whether a text that has transitions and times in each row lacks rows, for which the others have
-// entries, or the end of the last one. The kernel cuts a large table to one page.
-bool isCutTable(const std::string& path, const std::vector<std::string>& states,
-                const TableForm& form) {
-  TextBuffer buffer;
-  auto text = readKernelFile(path, ReadMode::Once, buffer);
-  if (!text || !text->ends_with('\n')) return true;
-  while (!text->empty()) {
-    std::string_view line = takeLine(*text);
-    if (!parseNumber(keyOfLine(line, form))) continue;
-    std::size_t tokens = 0;
-    while (!takeToken(line, form.separator).empty())
-      ++tokens;
-    if (tokens > states.size() + 1) return true;
-  }
-  return false;
+// Takes the next field of a row whose fields have 10 characters and may touch; the last is the
+// rest. Empty when it is shorter or does not end in a digit, as in rows of another width.
+std::string_view takeField(std::string_view& line, bool isLast) {
+  constexpr std::size_t kWidth = 10;
+  const std::string_view field = isLast ? line : line.substr(0, kWidth);
+  line.remove_prefix(field.size());
+  return field.size() >= kWidth && isDigit(field.back()) ? field : std::string_view();
 }
 
-// A table "FROM: ENTRIES OF STATE 0, OF STATE 1 ..." whose rows add up to the entries of states.
-// The kernel cuts a large table to one page: sums of a part would be too low.
+// A table "FROM: ENTRIES OF STATE 0, OF STATE 1 ..." whose rows, in the order of states, add up to
+// the entries of states. With `hasTimes` a row ends in the time of its state. Such rows may have
+// any width, except where figures touch: "%10u" leaves no blank before an entry or time of 10
+// digits. The kernel cuts a large table to one page: sums of a part would be too low.
 class TransitionReader final : public TextReader {
  public:
-  TransitionReader(const std::vector<std::string>& states, TableForm form)
-      : states_(states.begin(), states.end()), form_(form) {}
+  TransitionReader(std::vector<std::string> states, TableForm form, bool hasTimes)
+      : states_(std::move(states)), form_(form), hasTimes_(hasTimes) {}
 
   void read(std::string_view text, std::span<std::int64_t> slots) const override {
-    std::vector<std::int64_t> entries(slots.size());
+    // The line after the rows. In a part without it, entries might count as times.
+    if (hasTimes_ && text.find("\nTotal") == std::string_view::npos) return;
+    std::vector<std::int64_t> sums(slots.size());
     std::size_t rows = 0;
-    while (!text.empty()) {
+    while (!text.empty() && rows < states_.size()) {
       std::string_view line = takeLine(text);
-      if (!states_.contains(keyOfLine(line, form_))) continue;
-      ++rows;
-      for (std::int64_t& sum : entries) {
-        const auto count = parseNumber(takeToken(line, form_.separator));
-        if (!count) return;
-        sum = saturatingSum(sum, *count);
+      if (keyOfLine(line, form_) != states_[rows]) continue;
+      if (line.starts_with(':')) line.remove_prefix(1);
+      const bool hasFields = hasTimes_ && tokensIn(line, form_) <= states_.size();
+      const auto add = [&](std::int64_t& sum, bool isLast) {
+        const auto number =
+            parseNumber(hasFields ? takeField(line, isLast) : takeToken(line, form_.separator));
+        if (number) sum = saturatingSum(sum, *number);
+        return number.has_value();
+      };
+      for (std::size_t i = 0; i < states_.size(); ++i) {
+        if (!add(sums[i], false)) return;
       }
+      if (hasTimes_ && !add(sums[states_.size() + rows], true)) return;
+      if (tokensIn(line, form_) > 0) return;
+      ++rows;
     }
-    if (rows == slots.size()) std::ranges::copy(entries, slots.begin());
+    if (rows == states_.size()) std::ranges::copy(sums, slots.begin());
   }
 
  private:
-  std::unordered_set<std::string, KeyedHash, std::equal_to<>> states_;
+  std::vector<std::string> states_;
   TableForm form_;
+  bool hasTimes_;
 };
 
 std::unique_ptr<TableReader> timeReader(const std::vector<std::string>& states,
-                                        const TableForm& form, std::size_t token, Scale scale) {
-  auto reader = std::make_unique<TableReader>(form, std::vector<Cell>{{token, 0, scale}});
+                                        const TableForm& form, Scale scale) {
+  auto reader = std::make_unique<TableReader>(form, std::vector<Cell>{{1, 0, scale}});
   for (std::size_t i = 0; i < states.size(); ++i)
     reader->addRow(states[i], static_cast<std::uint32_t>(i));
   return reader;
@@ -89,12 +91,11 @@ std::unique_ptr<TableReader> timeReader(const std::vector<std::string>& states,
 
 // A device with a text of times, a text of transitions, and a file with the current state.
 struct StateTable {
-  std::string times;
+  std::string times;  // or the text of transitions again, when that has the times
   std::string transitions;
   std::string current;
   Speed currentSpeed;
   TableForm form;
-  bool timeIsLast;  // the time follows a row's transitions, not the state
   Scale scale;
   std::string (*nameOf)(std::int64_t number);
 };
@@ -103,8 +104,6 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
                    LiveSource& source) {
   const std::vector<std::string> states = numberedRows(table.times, table.form);
   if (states.empty()) return;
-  // Its transitions would count as times.
-  if (table.timeIsLast && isCutTable(table.times, states, table.form)) return;
   Residency residency;
   std::vector<std::string> names;
   for (const std::string& state : states) {
@@ -113,13 +112,14 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
   }
   residency.ids = stateIDs(names);
   const auto count = static_cast<std::uint32_t>(states.size());
-  const std::uint32_t first =
-      source.addTextFile(table.transitions, count,
-                         std::make_unique<TransitionReader>(states, table.form), ReadMode::Once);
-  source.addTextFile(
-      table.times, count,
-      timeReader(states, table.form, table.timeIsLast ? states.size() + 1 : 1, table.scale),
-      ReadMode::Once);
+  const bool hasTimes = table.times == table.transitions;
+  const std::uint32_t first = source.addTextFile(
+      table.transitions, hasTimes ? 2 * count : count,
+      std::make_unique<TransitionReader>(states, table.form, hasTimes), ReadMode::Once);
+  if (!hasTimes) {
+    source.addTextFile(table.times, count, timeReader(states, table.form, table.scale),
+                       ReadMode::Once);
+  }
   residency.currentSlot = source.addNumberFile(table.current, {}, table.currentSpeed);
   source.addStates(place, name, first, std::move(residency));
 }
@@ -156,7 +156,6 @@ void addCpuFrequency(const DeviceRoot& root, LiveSource& source) {
                    .current = policy.path + "/scaling_cur_freq",
                    .currentSpeed = Speed::Quick,
                    .form = {},
-                   .timeIsLast = false,
                    .scale = kTicks,
                    .nameOf = frequencyName},
                   {"CPU Frequency", policy.name, kMilliseconds}, policy.name + ".frequency",
@@ -175,7 +174,6 @@ void addDeviceFrequency(const DeviceRoot& root, LiveSource& source) {
                    .current = device.path + "/cur_freq",
                    .currentSpeed = Speed::Quick,
                    .form = {.mark = "*"},
-                   .timeIsLast = true,
                    .scale = {},
                    .nameOf = [](std::int64_t hertz) { return frequencyName(hertz / 1000); }},
                   {"Device Frequency", device.name, kMilliseconds}, device.name + ".frequency",
@@ -192,7 +190,6 @@ void addCooling(const DeviceRoot& root, LiveSource& source) {
                    .current = device.path + "/cur_state",
                    .currentSpeed = Speed::Slow,
                    .form = {.mark = "state"},
-                   .timeIsLast = false,
                    .scale = {},
                    .nameOf = [](std::int64_t state) { return "state" + std::to_string(state); }},
                   {"Cooling", device.name, kMilliseconds}, device.name + ".cooling_states", source);

@@ -13,14 +13,6 @@
 namespace tavrel::live {
 namespace {
 
-/// How many tokens remain in a line.
-std::size_t tokensIn(std::string_view line, const TableForm& form) {
-  std::size_t count = 0;
-  while (!takeToken(line, form.separator).empty())
-    ++count;
-  return count;
-}
-
 void skipHeadings(std::string_view& text, const TableForm& form) {
   for (std::size_t i = 0; i < form.headings; ++i)
     takeLine(text);
@@ -134,6 +126,13 @@ std::string_view keyOfLine(std::string_view& line, const TableForm& form) {
   for (std::size_t i = 0; i <= form.key; ++i)
     key = takeToken(ahead, form.separator);
   return key;
+}
+
+std::size_t tokensIn(std::string_view line, const TableForm& form) {
+  std::size_t count = 0;
+  while (!takeToken(line, form.separator).empty())
+    ++count;
+  return count;
 }
 
 void TableReader::addRow(std::string key, std::uint32_t firstSlot) {

@@ -31,6 +31,9 @@ struct TableForm {
 /// lines and for headings, which begin with a colon.
 std::string_view keyOfLine(std::string_view& line, const TableForm& form);
 
+/// How many tokens remain in a line.
+std::size_t tokensIn(std::string_view line, const TableForm& form);
+
 /// A figure of a row. Tokens are counted from 0, the key included.
 struct Cell {
   std::size_t token;
