@@ -88,18 +88,20 @@ void ReadingThreads::readPieces() {
     std::shared_ptr<Piece> piece;
     {
       std::unique_lock lock(mutex_);
+      // `next` waits for the first piece, so that one is read first, and even beyond the limit.
+      const auto first = [&] { return std::ranges::find(waiting_, order_.front()); };
       changed_.wait(lock, [&] {
         if (stopped_ || (foundAll_ && waiting_.empty())) return true;
         if (waiting_.empty()) return false;
-        // `next` waits for the first piece, so that one is read even beyond the limit.
-        return bytes_ < kBytesAhead || waiting_.front() == order_.front();
+        return bytes_ < kBytesAhead || first() != waiting_.end();
       });
       if (stopped_ || waiting_.empty()) return;
-      piece = std::move(waiting_.front());
-      waiting_.pop_front();
+      auto chosen = first();
+      if (chosen == waiting_.end()) chosen = waiting_.begin();
+      piece = std::move(*chosen);
+      waiting_.erase(chosen);
     }
     std::size_t bytes = 0;
-    std::shared_ptr<Piece> rest;
     try {
       auto item = piece->found.begin();
       for (; item != piece->found.end() && bytes < kPieceBytes; ++item) {
@@ -107,18 +109,17 @@ void ReadingThreads::readPieces() {
         bytes += piece->read.back().bytes;
       }
       if (item != piece->found.end()) {
-        rest = std::make_shared<Piece>();
+        auto rest = std::make_shared<Piece>();
         rest->found.assign(std::move_iterator(item), std::move_iterator(piece->found.end()));
+        const std::lock_guard lock(mutex_);
+        order_.insert(std::ranges::find(order_, piece) + 1, rest);
+        waiting_.push_front(std::move(rest));
       }
     } catch (...) {
       noteFailure();
     }
     piece->found.clear();
     const std::lock_guard lock(mutex_);
-    if (rest) {
-      order_.insert(std::ranges::find(order_, piece) + 1, rest);
-      waiting_.push_front(std::move(rest));
-    }
     bytes_ += bytes;
     piece->bytes += bytes;
     piece->isRead = true;

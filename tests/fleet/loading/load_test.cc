@@ -366,13 +366,24 @@ TEST_F(LoadTest, FilesOnceWhatTwoLoadersBring) {
             (std::multiset<std::string>{std::to_string(2 * kLogs)}));
 }
 
-TEST_F(LoadTest, ReadsNoFurtherAheadThanItsMemoryAllows) {
+TEST_F(LoadTest, HandsOutLargeLogsOneByOne) {
   const std::string large = gzipped(std::string(60U << 20, 'x'));
   for (int i = 0; i < 8; ++i)
     write(format("large/%d.log", i), large);
+  const std::string many = gzipped(std::string(30U << 20, 'x'));
+  constexpr int kMany = 64;
+  for (int i = 0; i < kMany; ++i)
+    write(format("many/%d.log", i), many);
   const PermittedKeys all;
-  ReadingThreads reading([&](const SourceSink& sink) { visitSources(at("large"), {}, sink); }, all,
-                         1);
+  const auto find = [&](const char* folder) {
+    return [this, folder](const SourceSink& sink) { visitSources(at(folder), {}, sink); };
+  };
+  // Later logs may take all the memory before an earlier one is read.
+  ReadingThreads crowd(find("many"), all, 8);
+  for (int i = 0; i < kMany; ++i)
+    EXPECT_TRUE(crowd.next());
+  EXPECT_FALSE(crowd.next());
+  ReadingThreads reading(find("large"), all, 1);
   while (!reading.isMoreRead())
     std::this_thread::yield();
   for (int i = 4; i < 8; ++i)
