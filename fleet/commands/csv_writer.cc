@@ -43,8 +43,9 @@ CsvWriter& CsvWriter::text(std::string_view value) {
   bool beginsCell = true;
   while (!value.empty()) {
     if (beginsCell && kFormulas.find(value.front()) != std::string_view::npos) safe += '\'';
-    // Spreadsheets of some languages separate cells by semicolons.
-    beginsCell = value.front() == ';';
+    // Where a spreadsheet's language separates cells by semicolons, quotation marks after a comma
+    // are within a cell, and a line end between them begins another one.
+    beginsCell = std::string_view(";\r\n").find(value.front()) != std::string_view::npos;
     const char32_t codePoint = takeCodePoint(value);
     appendCodePoint(safe, isControl(codePoint) ? kReplacementCharacter : codePoint);
   }

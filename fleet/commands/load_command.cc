@@ -107,7 +107,9 @@ void addLoadCommand(Command top, FleetContext& context) {
       .addOption("--set-aside", options->setAside, "Folder for copies of refused logs with reasons")
       .typeName("DIR");
   context.addJsonOption(command);
-  command.setFooter("The exit status is 1 when a log was refused; all others are loaded.");
+  command.setFooter(
+      "The exit status is 1 when a log was refused; the others are loaded, or left to the next "
+      "load.");
   command.onRun([&context, options] { load(context, *options); });
 }
 

@@ -338,8 +338,8 @@ TEST(ShowOutputTest, KeepsTheEndsOfBucketsApart) {
 
 TEST(CsvWriterTest, WritesNothingThatATerminalObeys) {
   std::ostringstream out;
-  CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F").text(";=1;a;;-");
-  EXPECT_EQ(out.str(), "\uFFFD\uFFFD[m\uFFFD\tü,'=\uFFFD,;'=1;a;;'-");
+  CsvWriter(out).text("\xFF\x1B[m\xC2\x9B\tü").text("=\x7F").text(";=1\n=a;;-");
+  EXPECT_EQ(out.str(), "\uFFFD\uFFFD[m\uFFFD\tü,'=\uFFFD,\";'=1\n'=a;;'-\"");
 }
 
 TEST_F(QuestionCommands, SayWhatIsWrong) {
