@@ -118,6 +118,7 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
                                              "open files in system"});
   lookUpResult = ENOENT;
   const FoldReport refusing = foldNow();
+  lookUpResult = 0;
   EXPECT_EQ(refusing.failure.value_or("") + std::to_string(refusing.refused), "1");
 }
 
