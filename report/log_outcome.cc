@@ -18,7 +18,7 @@ struct OutcomeTexts {
 constexpr OutcomeTexts kTexts[] = {
     {"filed", ""},
     {"filed-in-part", ""},
-    {"not-permitted", "submission is not allowed for that day"},
+    {"not-permitted", "no permission for that day"},
     {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist"},
     {"nothing-to-report", "no value found for any whitelisted key"},

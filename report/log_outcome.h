@@ -21,8 +21,7 @@ enum class LogOutcome : std::uint8_t {
   NotFiled,         // the system log has the error
 };
 
-/// Why there is no log, such as "submission is not allowed for that day"; empty for one filed, even
-/// in part.
+/// Why there is no log, such as "no permission for that day"; empty for one filed, even in part.
 std::string_view whyNoLog(LogOutcome outcome);
 /// "a log for day DAY", with what it lacks, or "no log for day DAY: " and the reason.
 std::string logOutcomeText(LogOutcome outcome, std::string_view day);

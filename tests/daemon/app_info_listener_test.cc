@@ -78,7 +78,7 @@ struct ListenerTest : ::testing::Test {
     Messages messages = fake.log.messages();
     std::erase(messages, kUnread);
     std::erase_if(messages, [](const std::string& message) {
-      return message.ends_with(": submission is not allowed for that day");
+      return message.ends_with(": no permission for that day");
     });
     return {messages.begin() + 1, messages.end() - 1};
   }

@@ -19,7 +19,7 @@ using std::chrono::milliseconds;
 constexpr const char* kDayKey = "LastCrashLogSerializationDateInDaysSince1970";
 
 const std::string kNeverCame = "never received requested AAI, so moving along without it";
-const std::string kNotPermitted = "no log for day 19999: submission is not allowed for that day";
+const std::string kNotPermitted = "no log for day 19999: no permission for that day";
 
 const std::string kUnread = "error reading nand info, error 1 with message Unable to parse buffer";
 

@@ -64,7 +64,7 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
                       "ago\n"
                       "OK last-log: the next run: no log for day " +
                       std::to_string(today() - 1) + " (" + isoAgo(kDay).substr(0, 10) +
-                      "): submission is not allowed for that day\n"
+                      "): no permission for that day\n"
                       "OK store: none yet\n"
                       "OK limits: nothing removed early since yesterday\n"
                       "OK lost-values: none since yesterday\n"
@@ -128,7 +128,7 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
   writeRun(kHour, true);
   device.write(kWhitelistFile, "<plist>");
   expect("WARNING last-log: the next run: no log for day " + std::to_string(today() - 1) + " (" +
-             isoAgo(kDay).substr(0, 10) + "): submission is not allowed for that day; " +
+             isoAgo(kDay).substr(0, 10) + "): no permission for that day; " +
              device.path(kWhitelistFile) +
              ": XML property list, line 1, column 8: no element found: repair it, or replace it "
              "with another whitelist\n",
@@ -170,20 +170,22 @@ TEST_F(CheckTest, JudgesTheLastLog) {
   device.run(own + "LastCrashLogSerializationDateInDaysSince1970 20001 --int");
   const std::string day = " log for day 20001 (2024-10-05)";
   for (const auto& [outcome, line, status] :
-       {std::tuple("filed", "OK last-log: the last run: a" + day + "\n", 0),
+       {std::tuple("filed", "OK last-log: the last daily run: a" + day + "\n", 0),
         {"filed-in-part",
-         "WARNING last-log: the last run: a" + day +
+         "WARNING last-log: the last daily run: a" + day +
              " without statistics that could not be read; see the system log\n",
          1},
         {"nothing-to-report",
-         "WARNING last-log: the last run: no" + day + ": no value found for any whitelisted key\n",
+         "WARNING last-log: the last daily run: no" + day +
+             ": no value found for any whitelisted key\n",
          1},
         {"store-unreadable",
-         "CRITICAL last-log: the last run: no" + day +
+         "CRITICAL last-log: the last daily run: no" + day +
              ": the statistics store could not be read; see the system log\n",
          2},
         {"not-filed",
-         "CRITICAL last-log: the last run: no" + day + ": filing failed; see the system log\n",
+         "CRITICAL last-log: the last daily run: no" + day +
+             ": filing failed; see the system log\n",
          2}}) {
     device.run(own + "LastLogOutcome " + outcome);
     expect(line, status);

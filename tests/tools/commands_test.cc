@@ -320,14 +320,14 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
   const std::string next = "next run: no log for day " + today["day"].dump() + " (" +
                            today["date"].get<std::string>() + "): ";
   const std::pair<std::string, std::string> kCases[] = {
-      {"list", next + "submission is not allowed for that day"},
+      {"list", next + "no permission for that day"},
       {"set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool",
        next + "no usable whitelist"},
-      {"delete " + dayKey, "last run: none yet"},
-      {"set " + dayKey + " 20001 --int", "last run: day 20001 (2024-10-05), outcome unknown"},
+      {"delete " + dayKey, "last daily run: none yet"},
+      {"set " + dayKey + " 20001 --int", "last daily run: day 20001 (2024-10-05), outcome unknown"},
       {"set " + own + "LastLogOutcome nothing-to-report",
-       "last run: no log for day 20001 (2024-10-05): no value found for any whitelisted key"},
-      {"set " + own + "LastLogOutcome filed", "last run: a log for day 20001 (2024-10-05)"}};
+       "last daily run: no log for day 20001 (2024-10-05): no value found for any whitelisted key"},
+      {"set " + own + "LastLogOutcome filed", "last daily run: a log for day 20001 (2024-10-05)"}};
   for (const auto& [change, why] : kCases) {
     if (change.starts_with("delete")) device.write(kWhitelistFile, xmlOf("{}"));
     device.run("prefs " + change);
@@ -486,7 +486,7 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   for (const auto& line :
        {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
         "Last OS version  none yet\n", " KiB, day 20000 (2024-10-04)\n",
-        "Outbox logs      0\nLast run         day 20001 (2024-10-05), outcome unknown\n"}) {
+        "Outbox logs      0\nLast daily run   day 20001 (2024-10-05), outcome unknown\n"}) {
     EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
   }
   const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");

@@ -150,7 +150,7 @@ void checkLastLog(CheckScene& scene) {
   const LogConclusion conclusion = concludeOnLogs(scene.context);
   Check check{"last-log"};
   check.state = conclusion.outcome ? stateOf(*conclusion.outcome) : CheckState::Unknown;
-  check.text = (conclusion.isOfNextRun ? "the next run: " : "the last run: ") + conclusion.text();
+  check.text = format("the %s: %s", conclusion.runText(), conclusion.text());
   if (scene.context.hasComplaints()) {
     check.state = CheckState::Unknown;
     check.text = "preferences cannot be read";

@@ -147,7 +147,7 @@ void printText(ToolContext& context, const DeviceStatus& status) {
     table.add(
         {"Refused logs", {format("%zu, refused by the server", *status.refused), Emphasis::Alarm}});
   }
-  table.add({status.conclusion.isOfNextRun ? "Next run" : "Last run",
+  table.add({status.conclusion.isOfNextRun ? "Next run" : "Last daily run",
              status.isStateReadable ? status.conclusion.text() : std::string("unknown")});
   table.print({context.out(), std::nullopt, context.page().isColoured});
 }

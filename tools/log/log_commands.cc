@@ -56,9 +56,9 @@ Expected<LogEnvelope> findLog(ToolContext& context, const std::string& name) {
   }
   if (!*latest) {
     const LogConclusion conclusion = concludeOnLogs(context);
-    return Error{format(
-        "no daily log found; %s run: %s; 'tavrelctl log preview' shows what a log would contain",
-        conclusion.run(), conclusion.text())};
+    return Error{
+        format("no daily log found; %s: %s; 'tavrelctl log preview' shows what a log would contain",
+               conclusion.runText(), conclusion.text())};
   }
   return envelopeOf(**latest);
 }

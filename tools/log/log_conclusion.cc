@@ -26,7 +26,7 @@ std::string LogConclusion::text() const {
 }
 
 Json LogConclusion::json() const {
-  return {{"run", run()},
+  return {{"run", isOfNextRun ? "next" : "last"},
           {"day", day ? Json(*day) : Json(nullptr)},
           {"date", day ? Json(dayDateText(*day)) : Json(nullptr)},
           {"outcome", outcome ? Json(nameOf(*outcome)) : Json(nullptr)}};

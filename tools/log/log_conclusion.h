@@ -28,9 +28,9 @@ struct LogConclusion {
   SubmissionPermission permission;
   WhitelistState whitelist;
 
-  /// "next" or "last".
-  const char* run() const { return isOfNextRun ? "next" : "last"; }
-  /// Such as "no log for day 20781 (2026-11-24): no usable whitelist".
+  /// Whose conclusion it is.
+  const char* runText() const { return isOfNextRun ? "next run" : "last daily run"; }
+  /// Such as "no log for day 20781 (2026-11-24): no permission for that day".
   std::string text() const;
   /// {"run": "next", "day": 20781, "outcome": "no-whitelist"}, with null for unknown parts.
   Json json() const;
