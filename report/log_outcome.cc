@@ -20,7 +20,7 @@ constexpr OutcomeTexts kTexts[] = {
     {"filed-in-part", ""},
     {"not-permitted", "no permission for that day"},
     {"permission-unknown", "the permission cannot be read"},
-    {"no-whitelist", "no usable whitelist"},
+    {"no-whitelist", "no usable whitelist; see 'tavrelctl whitelist check'"},
     {"nothing-to-report", "no value found for any whitelisted key"},
     {"store-unreadable", "the statistics store could not be read; see the system log"},
     {"not-filed", "filing failed; see the system log"},

@@ -127,7 +127,7 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
   };
   const Dictionary& own = fake.preferences.domain(kTavrelDomain);
   fake.submission.enabled = true;
-  EXPECT_EQ(run(1), "no log for day 1: no usable whitelist");
+  EXPECT_EQ(run(1), "no log for day 1: no usable whitelist; see 'tavrelctl whitelist check'");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("no-whitelist"));
   fake.setWhitelist({{"g", Dictionary{{"ScalarKeys", Dictionary{{"k", Dictionary::create()}}}}}});
   EXPECT_EQ(run(2), "no log for day 2: no value found for any whitelisted key");

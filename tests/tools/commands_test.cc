@@ -322,7 +322,7 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
   const std::pair<std::string, std::string> kCases[] = {
       {"list", next + "no permission for that day"},
       {"set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool",
-       next + "no usable whitelist"},
+       next + "no usable whitelist; see 'tavrelctl whitelist check'"},
       {"delete " + dayKey, "last daily run: none yet"},
       {"set " + dayKey + " 20001 --int", "last daily run: day 20001 (2024-10-05), outcome unknown"},
       {"set " + own + "LastLogOutcome nothing-to-report",
