@@ -4,6 +4,7 @@
 #include <curl/curl.h>
 #include <memory>
 #include <new>
+#include <utility>
 
 #include "base/limits.h"
 #include "base/version.h"
@@ -14,6 +15,9 @@ namespace {
 
 // bytes a second, below which a transfer counts as stalled
 constexpr long kSlowest = 100;
+
+constexpr const char* kDistrustAdvice =
+    ": check the URL, the clock, and tavrel-upload.authority in CREDENTIALS_DIRECTORY";
 
 void setText(CURL* handle, CURLoption option, const std::string& text) {
   if (!text.empty()) setOption(handle, option, text.c_str());
@@ -102,7 +106,11 @@ Expected<Answer> Connection::put(const std::string& url, const std::vector<std::
   const CURLcode code = curl_easy_perform(handle);
   isMisconfigured_ = code == CURLE_SSL_CERTPROBLEM || code == CURLE_SSL_CACERT_BADFILE;
   if (transfer.answerBytes > limits::kUploadAnswerBytes) return Error{"the answer is too long"};
-  if (code != CURLE_OK) return Error{curlFailure(code, words)};
+  if (code != CURLE_OK) {
+    std::string why = curlFailure(code, words);
+    if (code == CURLE_PEER_FAILED_VERIFICATION) why += kDistrustAdvice;
+    return Error{std::move(why)};
+  }
 
   Answer answer;
   curl_off_t seconds = 0;

@@ -34,7 +34,8 @@ TEST(Upload, SendsAllToNginxOldestFirst) {
        nameOf(3) + ": the server answers 400: check the certificate and the token; next attempt"},
       {server, "ca", "other", "the server answers 400"},
       {server, "ca", "forged", "the server answers 400"},
-      {server, "other", "device", "SSL certificate problem"},
+      {server, "other", "device",
+       ": check the URL, the clock, and tavrel-upload.authority in CREDENTIALS_DIRECTORY; next"},
       {format("https://localhost:%d/logs", nginx.port), "ca", "device",
        "no alternative certificate subject name matches"},
       {server + "s", "ca", "device", "the server answers 404: check the URL"}};
