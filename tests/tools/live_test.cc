@@ -312,6 +312,9 @@ TEST(LiveTest, ARootShowsOnlyItsOwnFolders) {
   const TemporaryDevice bare;
   bare.write("/sys/devices/system/edac/mc/mc0/ce_count", "1\n");
   bare.check("report list", prints("no channels\n"));
+  bare.check("report sample --live",
+             fails("no live channels: " + bare.path("/proc") +
+                   " is missing: link /proc and /sys into the device root"));
   // With the link, the root uses the machine's own folder.
   std::filesystem::create_symlink("/proc", bare.path("/proc"));
   EXPECT_EQ(bare.run("report sample --group Boot --live").status, 0);

@@ -4,11 +4,27 @@
 #include <string>
 
 #include "base/format.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording_folder.h"
 
 namespace tavrel {
+namespace {
+
+std::string whyNoChannels(const DeviceRoot& root, const ReportSelection& selection) {
+  if (selection.isEmpty()) {
+    return format("no channels: recordings of drivers belong in %s", root.path(kRecordingFolder));
+  }
+  const std::string proc = root.path("/proc");
+  if (selection.live && !FileSystem::status(proc)) {
+    return format("no live channels: %s is missing: link /proc and /sys into the device root",
+                  proc);
+  }
+  return "no channel matches: 'tavrelctl report list' shows all";
+}
+
+}  // namespace
 
 Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatform& noting,
                                              const ReportSelection& selection) {
@@ -33,10 +49,7 @@ Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
     return;
   }
   if (IOReportGetChannelCount(*selected) == 0) {
-    context.fail(selection.isEmpty()
-                     ? format("no channels: recordings of drivers belong in %s",
-                              context.root().path(kRecordingFolder))
-                     : std::string("no channel matches: 'tavrelctl report list' shows all"));
+    context.fail(whyNoChannels(context.root(), selection));
     return;
   }
   std::optional<ErrorObject> error;
