@@ -212,7 +212,7 @@ void printShown(FleetContext& context, const ShowAnswer& answer, bool buckets) {
   const std::string& key = answer.request.key;
   out << printable(key) << ": " << kindText(answer.request.kind);
   if (const catalogue::Entry* entry = catalogue::findStatistic(key)) {
-    if (!entry->unit.empty()) out << ", in " << entry->unit;
+    if (!entry->unit.empty()) out << " (" << entry->unit << ')';
     if (!entry->meaning.empty()) out << "\n" << entry->meaning;
   }
   out << "\n";

@@ -188,7 +188,7 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
     }
     const bool isScalar = answer.request.kind == KeyKind::kScalar;
     html.text(isScalar ? "one value per log" : "many values per log");
-    if (!unit.empty()) html.text(", in " + std::string(unit));
+    if (!unit.empty()) html.text(" (" + std::string(unit) + ")");
     html.end();
     writeSets(html, side, name, unit);
     const std::size_t withoutMean = side.whole.merged ? side.whole.merged->logsWithoutMean : 0;

@@ -212,8 +212,10 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
   const std::string page = run(file, {"page", "-o", "-"}).out;
   for (const char* bar : {"\"1000.2 to 1000.4: 20\"", "\"1000.4 to 1000.6: 20\""})
     EXPECT_THAT(page, HasSubstr(std::string("aria-label=") + bar));
+  EXPECT_THAT(page, HasSubstr(", many values per log (milliseconds)</p>"));
   EXPECT_THAT(page, HasSubstr("data-title=\"Mean\">1 s</td>"));
   EXPECT_THAT(page, HasSubstr("data-title=\"Median\">1000.2 to 1000.4 milliseconds</td>"));
+  EXPECT_THAT(run(file, {"show", kKey}).out, HasSubstr(": distribution (milliseconds)\n"));
 }
 
 TEST_F(QuestionCommands, PagesAreBounded) {
