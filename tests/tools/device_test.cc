@@ -120,7 +120,7 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
                       "    com.norvane.da  AggressiveSubmissionDays  3\n"
                       "    d               k                         \"x\\n\"\n"
                       "Applied tasking: t1\n  OS build: B1\n  digest: -\n  settings: none\n"
-                      "Last OS update: B1, first seen on day 20000\n"
+                      "Last OS update: B1, first seen on day 20000 (2024-10-04)\n"
                       "The next daily run changes nothing.\n"));
 
   device.run("tasking schedule -", R"({"TaskingID": "t2"})");

@@ -1,18 +1,22 @@
 #include "tools/device/tasking_commands.h"
 
 #include <cstddef>
+#include <cstdint>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
+#include "base/arithmetic.h"
 #include "daemon/tasking.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/device/tasking_document.h"
+#include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
@@ -77,6 +81,13 @@ std::string text(const plist::Value& value) {
   return value.string() ? std::string(*value.string()) : inlineText(value);
 }
 
+std::string dayOrText(const plist::Value& value) {
+  const auto number = value.number();
+  const bool isDay =
+      number && !number->isFloating() && std::in_range<std::int32_t>(number->int64());
+  return isDay ? dayText(lowInt32(number->int64())) : text(value);
+}
+
 Json json(const Tasking& tasking) {
   if (!tasking.identifier && !tasking.payload) return nullptr;
   Json object = {{"TaskingID", jsonOf(tasking.identifier)}};
@@ -124,7 +135,7 @@ void show(ToolContext& context) {
   context.out() << "Last OS update: ";
   if (taskings.lastUpdate) {
     context.out() << printable(text(taskings.lastUpdate.get("version"))) << ", first seen on day "
-                  << printable(text(taskings.lastUpdate.get("day"))) << '\n';
+                  << printable(dayOrText(taskings.lastUpdate.get("day"))) << '\n';
   } else {
     context.out() << "none seen\n";
   }
