@@ -22,7 +22,7 @@ std::string folderOf(const std::string& path) {
 }
 
 constexpr std::string_view kSetAsideMark = ".corrupt-";
-// 2020-01-01: clocks that were never set begin earlier.
+// 2020-01-01: a clock that shows an earlier day was not set.
 constexpr std::int64_t kFirstPlausibleDay = 18262;
 
 // A name for which neither the file nor its log files exist yet.
@@ -154,11 +154,12 @@ StoreLoss StoreSite::lastLoss() const {
       return day && *day >= kFirstPlausibleDay && *day <= today;
     };
     std::optional<std::int64_t> day = dayInStamp(std::string_view(name).substr(beginning.size()));
-    if (!isPlausible(day)) {
-      // The clock was wrong when it was set aside. Whoever inspects or copies the file may change
-      // its time, so that is only second best.
-      const auto status = FileSystem::status(file);
-      if (status) day = dayOfSecond(status->st_mtim.tv_sec);
+    // When the clock was wrong then, the last change tells more. Setting it aside sets the ctime,
+    // which is before the last change only if the clock was behind; inspecting or copying the file
+    // changes both.
+    const auto status = FileSystem::status(file);
+    if (status && (!isPlausible(day) || status->st_ctim.tv_sec < status->st_mtim.tv_sec)) {
+      day = dayOfSecond(status->st_mtim.tv_sec);
     }
     if (isPlausible(day) && *day >= last.lastDay) last = {*day, lossOf(file)};
   }
