@@ -313,7 +313,7 @@ TEST_F(FoldTest, ALookSaysWhatItCouldNotShow) {
   openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
       .execute("UPDATE segments SET position = x'63000000'");  // from another version
   EXPECT_EQ(warnings(),
-            Lines{"1 segments with values that wait are not shown: run 'tavrelctl stat fold'"});
+            Lines{"1 segment with values that wait is not shown: run 'tavrelctl stat fold'"});
   kill(child, SIGKILL);
   waitFor(child);
 }

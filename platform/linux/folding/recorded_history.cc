@@ -122,14 +122,10 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
     isOvertaken = !isSame(FoldNotes::lastMark(root), mark);
   }
   if (const std::uint64_t leftOut = history.waiting_->leftOut(); leftOut > 0) {
-    history.missingValues_.push_back(
-        std::to_string(leftOut) +
-        " segments with values that wait are not shown: run 'tavrelctl stat fold'");
-  }
-  if (!recorders.areUsersKnown()) {
-    history.missingValues_.push_back(root.path(kRecordersFile) +
-                                     " names users who cannot be looked up now: what users other "
-                                     "than root recorded may not be shown");
+    history.missingValues_.push_back(std::to_string(leftOut) +
+                                     (leftOut == 1 ? " segment with values that wait is"
+                                                   : " segments with values that wait are") +
+                                     " not shown: run 'tavrelctl stat fold'");
   }
   if (isOvertaken) {
     history.missingValues_.emplace_back(

@@ -397,7 +397,7 @@ FoldReport SegmentFold::run() {
     const Status done = foldAll(**folder, store_, *notes, recorders, report, most, *listing);
     if (!done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
-    } else if (!recorders.areUsersKnown()) {
+    } else if (!recorders.areUsersKnown() && report.waiting > 0) {
       report.failure = root_.path(kRecordersFile) +
                        " names users who cannot be looked up now; what users other than root "
                        "recorded waits for the next fold";

@@ -27,11 +27,11 @@ struct FoldReport {
   std::uint64_t scalars = 0;           // changes of scalars
   std::uint64_t values = 0;            // measurements
   std::uint64_t removed = 0;           // segments that nobody will write to any more
-  std::uint64_t waiting = 0;           // segments left for the next fold, because of a limit
+  std::uint64_t waiting = 0;           // segments left for the next fold
   std::uint64_t dropped = 0;           // values for which the programs had no room
   std::uint64_t refused = 0;           // values that were not taken
   std::uint64_t segmentsRefused = 0;   // files refused for the first time
-  std::optional<std::string> failure;  // why the fold ended early; the rest waits
+  std::optional<std::string> failure;  // why it did not take everything; the rest waits
 };
 
 class SegmentFold {

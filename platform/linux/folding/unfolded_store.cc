@@ -59,7 +59,7 @@ class UnfoldedStore::History final : public BHHistory {
       return false;
     }
     rows_ = *std::move(rows);
-    lacksRows_ = !rows_->isStoreComplete(before) || !recorders_.areUsersKnown();
+    lacksRows_ = !rows_->isStoreComplete(before);
     if (rows_->storeFault()) store_.log_.write(LogLevel::Error, rows_->storeFault()->message);
     store_.missing_.insert(store_.missing_.end(), rows_->missingValues().begin(),
                            rows_->missingValues().end());

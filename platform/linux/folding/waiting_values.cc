@@ -67,7 +67,9 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
   FoldedRows rows;
   PendingDistributions buffer;
   for (const SegmentEntry& entry : listing->segments) {
-    if (waiting.blocks_ >= limits::kWaitingBlocks ||
+    // A fold would leave segments of unknown rights, too.
+    const bool isUnknown = entry.owner != 0 && !recorders.areUsersKnown();
+    if (isUnknown || waiting.blocks_ >= limits::kWaitingBlocks ||
         waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
       ++waiting.leftOut_;
       continue;

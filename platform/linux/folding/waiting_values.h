@@ -58,8 +58,8 @@ class WaitingValues {
 
   const RowMap<ScalarChanges::Change>& scalars() const { return scalars_.rows(); }
   const RowMap<Series>& distributions() const { return distributions_; }
-  /// Segments that were left out because of a limit, or because another version of this program
-  /// began to fold them.
+  /// Segments that were left out because of a limit, because another version of this program began
+  /// to fold them, or because users cannot be looked up.
   std::uint64_t leftOut() const { return leftOut_; }
 
   /// The next measurements of the row, at most as many as fit; 0 at its end. Moves `place` past
