@@ -13,7 +13,7 @@ std::ptrdiff_t countOf(const std::string& text, const std::string& expression) {
 }
 
 struct PageTest : testing::Test {
-  const TemporaryDevice device;
+  const TemporaryDevice device{};
 
   void import(const std::string& lines) const {
     ASSERT_EQ(device.run("stat import -", lines).status, 0);
