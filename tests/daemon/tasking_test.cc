@@ -54,7 +54,7 @@ TEST_F(TaskingTest, AppliesOnceMoreWhatFoundNoMemory) {
     EXPECT_THROW(track(), std::bad_alloc) << key;
     EXPECT_EQ(nextTaskingChange(fake.platform), TaskingChange::Apply) << key;
   }
-  fake.preferences.keyWithoutMemory = "none";
+  fake.preferences.keyWithoutMemory.reset();
   track();
   EXPECT_EQ(own.get("TaskingPayload"), plist::Value(payload));
   EXPECT_EQ(nextTaskingChange(fake.platform), TaskingChange::None);

@@ -53,7 +53,7 @@ struct FakePreferences : Preferences {
   explicit FakePreferences(Journal& journalOfCalls) : journal(journalOfCalls) {}
   Journal& journal;
   std::map<std::string, plist::Dictionary, std::less<>> domains;
-  std::string keyWithoutMemory = "none";
+  std::optional<std::string> keyWithoutMemory;
 
   plist::Dictionary& domain(std::string_view name) {
     return domains.try_emplace(std::string(name), plist::Dictionary::create()).first->second;
