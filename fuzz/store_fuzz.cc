@@ -3,13 +3,13 @@
 // and examining must end with the rows or with a reason. Runs and kept values must read
 // back as they were written.
 //
-// Input: a byte that chooses between the store, runs and kept values, and whether SQLite examines
-// the store; then their content.
+// Input: a byte that chooses between the store, runs and kept values, and what happens to the
+// store: adding, erasing, and examining by SQLite; then their content.
 #include <algorithm>
 #include <limits>
+#include <sqlite3.h>
 #include <vector>
 
-#include "base/text.h"
 #include "memory_tree.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/preferences/file_preferences.h"
@@ -19,6 +19,7 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/plist/coding.h"
 #include "platform/store_path.h"
+#include "sqlite_memory.h"
 #include "support.h"
 
 using namespace tavrel;
@@ -38,54 +39,96 @@ struct Device : fuzz::Tree {
   SqliteStore store{root, clock, preferences, log, 0};
 };
 
-// An SQL literal: an integer, a real number, a text or a blob.
-std::string literal(fuzz::Input& input) {
-  switch (const unsigned kind = input.byte(); kind % 8) {
+// Binds an integer, a real number, a text or a blob.
+void bindValue(sqlite3_stmt* statement, int at, fuzz::Input& input) {
+  const unsigned kind = input.byte();
+  std::string bytes;
+  switch (kind % 8) {
     case 0:
-      return std::to_string(static_cast<std::int64_t>(input.word(8)));
+      sqlite3_bind_int64(statement, at, static_cast<std::int64_t>(input.word(8)));
+      break;
     case 1:
-      return std::to_string(input.byte()) + ".5";
+      sqlite3_bind_double(statement, at, input.byte() + 0.5);
+      break;
     case 2:
-      return "'" + std::to_string(input.byte()) + "'";
+      bytes = std::to_string(input.byte());
+      sqlite3_bind_text(statement, at, bytes.data(), static_cast<int>(bytes.size()),
+                        SQLITE_TRANSIENT);
+      break;
     case 3:
-    case 4: {
-      std::string blob = "x'";
-      appendHex(blob, asBytes(input.upTo(kind / 8)));
-      return blob + "'";
-    }
+    case 4:
+      bytes = input.upTo(kind / 8);
+      sqlite3_bind_blob(statement, at, bytes.data(), static_cast<int>(bytes.size()),
+                        SQLITE_TRANSIENT);
+      break;
     default:
-      return std::to_string(kind / 8);
+      sqlite3_bind_int64(statement, at, kind / 8);
   }
 }
 
-// Makes tables without STRICT, so that every column takes every type.
-void makeRows(const std::string& path, fuzz::Input& input) {
-  const bool isFirstVersion = input.byte() % 4 == 0;
-  SqliteConnection made(path, SqliteConnection::Access::Create, std::make_shared<BusyBudget>(0));
-  made.execute("PRAGMA journal_mode = OFF; PRAGMA synchronous = OFF; BEGIN");
-  std::string sql =
-      "CREATE TABLE scalars (day, key, value, PRIMARY KEY (day, key)) WITHOUT ROWID;"
-      "CREATE TABLE chunks (chunk INTEGER PRIMARY KEY, data);"
-      "CREATE TABLE segments (owner, identity, position, PRIMARY KEY (owner, identity)) "
-      "WITHOUT ROWID;"
-      "CREATE TABLE distributions (day, key, count, ";
-  sql += isFirstVersion ? "series" : "runs";
-  sql += ", PRIMARY KEY (day, key)) WITHOUT ROWID; PRAGMA user_version = ";
-  made.execute((sql + (isFirstVersion ? "1" : "2")).c_str());
-  for (int row = 0; row < 40 && !input.empty(); ++row) {
-    const unsigned kind = input.byte();
-    sql = kind % 4 == 0   ? "INSERT OR IGNORE INTO scalars VALUES ("
-          : kind % 4 == 1 ? "INSERT OR IGNORE INTO distributions VALUES ("
-                          : "INSERT OR IGNORE INTO chunks VALUES (";
-    if (kind % 4 > 1) {
-      sql += std::to_string(input.byte() % 8) + ',' + literal(input);
-    } else {
-      sql += literal(input) + ',' + literal(input) + ',' + literal(input);
-      if (kind % 4 == 1) sql += ',' + literal(input);
-    }
-    made.execute((sql + ")").c_str());
+// A store in SQLite's memory with tables without STRICT, so that every column takes every type.
+// Rows are added in a transaction that is rolled back: making tables for each input would take
+// longer than reading them.
+class RowMaker {
+ public:
+  explicit RowMaker(int version) {
+    require(sqlite3_open(":memory:", &store_) == SQLITE_OK);
+    std::string sql =
+        "CREATE TABLE scalars (day, key, value, PRIMARY KEY (day, key)) WITHOUT ROWID;"
+        "CREATE TABLE chunks (chunk INTEGER PRIMARY KEY, data);"
+        "CREATE TABLE segments (owner, identity, position, PRIMARY KEY (owner, identity)) "
+        "WITHOUT ROWID;"
+        "CREATE TABLE distributions (day, key, count, ";
+    sql += version == 1 ? "series" : "runs";
+    sql += ", PRIMARY KEY (day, key)) WITHOUT ROWID; PRAGMA user_version = ";
+    run((sql + std::to_string(version)).c_str());
+    scalars_ = prepare("INSERT OR IGNORE INTO scalars VALUES (?1, ?2, ?3)");
+    distributions_ = prepare("INSERT OR IGNORE INTO distributions VALUES (?1, ?2, ?3, ?4)");
+    chunks_ = prepare("INSERT OR IGNORE INTO chunks VALUES (?1, ?2)");
   }
-  made.execute("COMMIT");
+
+  /// The store's file with the rows that the input describes.
+  std::string make(fuzz::Input& input) {
+    run("BEGIN");
+    for (int row = 0; row < 40 && !input.empty(); ++row) {
+      const unsigned kind = input.byte() % 4;
+      sqlite3_stmt* const statement = kind == 0 ? scalars_ : kind == 1 ? distributions_ : chunks_;
+      int at = 1;
+      if (kind > 1) sqlite3_bind_int64(statement, at++, input.byte() % 8);
+      while (at <= sqlite3_bind_parameter_count(statement))
+        bindValue(statement, at++, input);
+      require(sqlite3_step(statement) == SQLITE_DONE);
+      sqlite3_reset(statement);
+    }
+    sqlite3_int64 size = 0;
+    unsigned char* const bytes = sqlite3_serialize(store_, "main", &size, 0);
+    require(bytes != nullptr);
+    std::string file(reinterpret_cast<const char*>(bytes), static_cast<std::size_t>(size));
+    sqlite3_free(bytes);
+    run("ROLLBACK");
+    return file;
+  }
+
+ private:
+  void run(const char* sql) {
+    require(sqlite3_exec(store_, sql, nullptr, nullptr, nullptr) == SQLITE_OK);
+  }
+  sqlite3_stmt* prepare(const char* sql) {
+    sqlite3_stmt* statement = nullptr;
+    require(sqlite3_prepare_v2(store_, sql, -1, &statement, nullptr) == SQLITE_OK);
+    return statement;
+  }
+
+  sqlite3* store_ = nullptr;
+  sqlite3_stmt* scalars_ = nullptr;
+  sqlite3_stmt* distributions_ = nullptr;
+  sqlite3_stmt* chunks_ = nullptr;
+};
+
+void makeRows(Device& device, fuzz::Input& input) {
+  static RowMaker first(1);
+  static RowMaker second(2);
+  device.write(kStorePath, (input.byte() % 4 == 0 ? first : second).make(input));
 }
 
 // Makes a sound store and changes some of its bytes.
@@ -111,6 +154,12 @@ void damage(Device& device, fuzz::Input& input) {
   }
   device.write(kStorePath, bytes);
 }
+
+// Everything that SQLite allocates meanwhile must be freed: no sanitizer sees its leaks.
+struct NothingHeld {
+  ~NothingHeld() { require(fuzz::sqliteBlocks() == before); }
+  const std::size_t before = fuzz::sqliteBlocks();
+};
 
 // Every failure must have a reason.
 void tell(const auto& outcome) {
@@ -149,16 +198,28 @@ void read(SqliteHistory& history, bool isExamined) {
   if (days) require(std::ranges::is_sorted(*days));
 }
 
-void useStore(Device& device, bool isExamined) {
-  if (auto history = device.store.openHistory()) read(**history, isExamined);
+void add(Device& device) {
   if (auto batch = device.store.beginBatch()) {
     (*batch)->refuseUnwritableSeries();
     const bool isAdded = (*batch)->addScalar(1, "a", 1) && (*batch)->appendValue(1, "a", 1, 1.0) &&
                          (*batch)->commit();
     static_cast<void>(isAdded);
   }
-  tell(device.store.erase({"a", 0, 2}));
-  if (auto history = device.store.openHistory()) read(**history, false);
+}
+
+struct Steps {
+  explicit Steps(unsigned choice)
+      : adds(choice / 32 % 2 != 0), erases(choice / 64 % 2 != 0), examines(choice / 4 % 8 == 1) {}
+  bool adds, erases, examines;
+};
+
+// Each step opens the store, which takes longer than reading or writing a few rows. So the input
+// chooses what happens before the store is read.
+void useStore(Device& device, const Steps& steps) {
+  const NothingHeld check;
+  if (steps.adds) add(device);
+  if (steps.erases) tell(device.store.erase({"a", 0, 2}));
+  if (auto history = device.store.openHistory()) read(**history, steps.examines);
 }
 
 void readRuns(std::string_view packed) {
@@ -174,6 +235,7 @@ void readRuns(std::string_view packed) {
 }
 
 void readKept(Device& device, std::string content) {
+  const NothingHeld check;
   content += asText(sha256(asBytes(content)));
   device.write(std::string(kStorePath) + "-kept", content);
   KeptValues kept(device.store.path());
@@ -190,6 +252,11 @@ void readKept(Device& device, std::string content) {
 
 }  // namespace
 
+extern "C" int LLVMFuzzerInitialize(int*, char***) {
+  fuzz::setUpSqliteMemory();
+  return 0;
+}
+
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   Device device;
@@ -197,12 +264,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const unsigned choice = input.byte();
   switch (choice % 4) {
     case 0:
-      makeRows(device.store.path(), input);
-      useStore(device, choice / 4 % 8 == 1);
+      makeRows(device, input);
+      useStore(device, Steps(choice));
       break;
     case 1:
       damage(device, input);
-      useStore(device, choice / 4 % 8 == 1);
+      useStore(device, Steps(choice));
       break;
     case 2:
       readRuns(input.text());
