@@ -2,9 +2,10 @@
 // SMART data. A reading must say what it was read from or why there is none, labels must be
 // printable, and whatever was written must read back.
 //
-// Input: a byte that chooses SMART data alone or the machine, and which drives it lacks; then the
-// attributes of the SMART data, or numbers of attributes with their contents, each followed by
-// 0xFF, and finally the drives' answer.
+// Input: a byte that chooses SMART data alone or the machine, which drives it lacks, and on how
+// many days they are read, rather than only found; then the attributes of the SMART data, or
+// numbers of attributes with their contents, each followed by 0xFF, and finally the drives' answer.
+#include <algorithm>
 #include <dlfcn.h>
 #include <map>
 #include <optional>
@@ -98,34 +99,44 @@ void readSmart(std::string_view blob) {
   figuresOf({reading});
 }
 
-void readMachine(fuzz::Input& input, unsigned without) {
-  fuzz::Tree tree;
-  if ((without & 1) == 0) tree.write("/sys/block/mmcblk0/device/type", "MMC");
-  if ((without & 2) == 0) tree.write("/sys/block/sda/device/vendor", "ATA");
-  for (int i = 0; i < 4 && !input.empty(); ++i) {
-    const std::string_view path = kAttributes[input.byte() % std::size(kAttributes)];
-    tree.write(path, input.part());
+void checkLabels(const Drive& drive) {
+  for (const std::string& label : {drive.model, drive.firmware, drive.serial}) {
+    require(label.size() <= 64);
+    for (const char c : label)
+      require(c >= ' ' && c <= '~');
   }
-  const auto drives = findDrives(Machine(tree.root));
-  require(static_cast<bool>(drives));
-  for (const Drive& drive : *drives) {
-    for (const std::string& label : {drive.model, drive.firmware, drive.serial}) {
-      require(label.size() <= 64);
-      for (const char c : label)
-        require(c >= ' ' && c <= '~');
-    }
-    require(!drive.capacity || *drive.capacity >= 0);
-  }
+  require(!drive.capacity || *drive.capacity >= 0);
+}
+
+void readDrives(fuzz::Tree& tree, std::string_view answer, int days) {
   fuzz::SilentLog log;
   FileSystem files;
-  Answers answers{std::string(input.text())};
+  Answers answers{std::string(answer)};
   HealthReader reader(tree.root, files, answers, log);
-  for (const std::int64_t now : {1'700'000'000, 1'700'086'400}) {
-    require(reader.readAll(now));
+  for (int day = 0; day < days; ++day) {
+    require(reader.readAll(1'700'000'000 + day * 86'400));
     const Readings readings = loadReadings(tree.root, files);
     require(readings.faults.empty());
     for (const Reading& reading : readings.readings)
       require(!reading.from.empty() || !reading.error.empty());
+  }
+}
+
+void useMachine(fuzz::Input& input, unsigned choice) {
+  fuzz::Tree tree;
+  if (choice % 2 == 0) tree.write("/sys/block/mmcblk0/device/type", "MMC");
+  if (choice / 2 % 2 == 0) tree.write("/sys/block/sda/device/vendor", "ATA");
+  for (int i = 0; i < 4 && !input.empty(); ++i) {
+    const std::string_view path = kAttributes[input.byte() % std::size(kAttributes)];
+    tree.write(path, input.part());
+  }
+  // Reading a drive takes longer than finding it.
+  if (const unsigned days = choice / 4 % 4; days > 0) {
+    readDrives(tree, input.text(), days == 3 ? 2 : 1);
+  } else {
+    const auto drives = findDrives(Machine(tree.root));
+    require(static_cast<bool>(drives));
+    std::ranges::for_each(*drives, checkLabels);
   }
 }
 
@@ -156,7 +167,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       readSmart(smartData(input.text()));
       break;
     default:
-      readMachine(input, choice / 4);
+      useMachine(input, choice / 4);
   }
   return 0;
 }
