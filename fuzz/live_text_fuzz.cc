@@ -4,6 +4,7 @@
 //
 // Input: the number of a file, its content and 0xFF; repeated.
 #include <array>
+#include <set>
 #include <utility>
 #include <vector>
 
@@ -21,7 +22,7 @@ using fuzz::require;
 
 struct File {
   const char* path;
-  const char* content;  // used unless the input gives one; null means no file
+  const char* content;  // used when the input has another file of the device, but not this one
   bool isSlow = false;  // read by a separate thread, because a device may block the reader
 };
 constexpr LiveMachine::Options kPatient{10'000, 10'000};
@@ -63,6 +64,12 @@ constexpr File kFiles[] = {
     {"/sys/block/sda/device/x", "x"},
 };
 
+// The folder of the device that a file is about.
+std::string_view deviceOf(std::string_view path) {
+  constexpr std::string_view kGroups = "/sys/fs/cgroup";
+  return path.starts_with(kGroups) ? kGroups : path.substr(0, path.rfind('/'));
+}
+
 // The size in bytes of the largest channel, and the number of channels.
 std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling& sampling) {
   std::size_t count = 0;
@@ -89,17 +96,22 @@ std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   fuzz::Input input(data, size);
   std::array<std::string, std::size(kFiles)> contents;
-  for (std::size_t i = 0; i < contents.size(); ++i)
-    contents[i] = kFiles[i].content;
+  std::array<bool, std::size(kFiles)> isGiven{};
+  // Other tables name the disk. Of other devices, only those that the input changes are there: to
+  // find all of them takes longer than to read one.
+  std::set<std::string_view> devices{"/sys/block/sda", "/sys/block/sda/device"};
   std::size_t last = 0;
   bool isPatient = false;
   while (!input.empty()) {
     last = input.byte() % contents.size();
     contents[last] = input.part();
+    isGiven[last] = true;
+    devices.insert(deviceOf(kFiles[last].path));
     isPatient = isPatient || kFiles[last].isSlow;
   }
   fuzz::Tree tree;
   for (std::size_t i = 0; i < contents.size(); ++i) {
+    if (!isGiven[i] && devices.contains(deviceOf(kFiles[i].path))) contents[i] = kFiles[i].content;
     if (i == last || !contents[i].empty()) tree.write(kFiles[i].path, contents[i]);
   }
 
