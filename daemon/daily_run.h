@@ -19,7 +19,8 @@ std::optional<LogOutcome> runDailyIfNeeded(Platform& platform, const plist::Arra
                                            const StepObserver& onStep = {});
 
 /// The tasks for one day, without the gate. A task's failure, even an exception, does not stop
-/// later tasks. Returns the outcome of the log; when no log was filed, an info line says why.
+/// later tasks. Returns the outcome of the log; when no log was filed, an info line, or
+/// errors when filing failed, say why.
 LogOutcome dailyTasksForDay(Platform& platform, std::int32_t day, const plist::Array& appInfo,
                             const StepObserver& onStep = {});
 

@@ -15,7 +15,8 @@ class Locale {
   virtual std::vector<std::string> preferredLanguages() = 0;
   virtual std::vector<std::string> systemLanguages() = 0;
 
-  /// The languages of `available` that suit `preferred`, best first.
+  /// The languages of `available` that suit `preferred`, best first; when none does, the first of
+  /// `available`. Empty without available or preferred languages.
   virtual std::vector<std::string> matchLocalizations(
       const std::vector<std::string>& available, const std::vector<std::string>& preferred) = 0;
 

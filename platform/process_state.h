@@ -11,7 +11,8 @@ struct ProcessState {
   /// A client has announced app information and not delivered it yet.
   bool appInfoRequested = false;
 
-  /// The process has acted on a client's announcement or forced day, and ignores further ones.
+  /// The process has received a request other than a delivery, known or not, and ignores further
+  /// ones.
   bool clientRequestHandled = false;
 
   /// The device-answers query "InternalBuild", asked once.

@@ -20,7 +20,7 @@
 
 namespace tavrel {
 
-/// The type and name under which the submission service files the log.
+/// The name under which the submission service files the log.
 inline constexpr std::string_view kTalliedLogName = "log-tallied";
 
 class BHReport {

@@ -72,7 +72,9 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
       if (entry.path().extension().string().starts_with(".corrupt-")) aside = entry.path();
     }
     EXPECT_EQ(contentOf(aside), content);
-    EXPECT_EQ(process.preferences.domains()->size(), 1U);
+    device.write("/var/mobile/Library/Preferences/com.example.domain-b.plist", "");
+    EXPECT_EQ(*process.preferences.domains(),
+              (std::vector<std::string>{"com.example.domain", "com.example.domain-b"}));
   }
 }
 

@@ -75,6 +75,8 @@ Expected<std::vector<std::string>> FilePreferences::domains() {
   std::erase_if(*names, [](const std::string& name) { return !name.ends_with(kEnding); });
   for (std::string& name : *names)
     name.resize(name.size() - kEnding.size());
+  // With the ending, "a-b" came before "a".
+  std::ranges::sort(*names);
   return names;
 }
 

@@ -11,7 +11,7 @@
 // the file is dropped with a log line, so that the domain's other changes are written.
 //
 // A file that is not a property list is reported once, reads as empty, and is set aside as
-// "<domain>.plist.corrupt-<stamp>" when the domain is next written.
+// "<domain>.plist.corrupt-<stamp>-<unique>" when the domain is next written.
 #pragma once
 
 #include <functional>

@@ -76,7 +76,7 @@ class SqliteHistory : public BHHistory {
   Expected<std::optional<DaySpan>> daysHeld();
   /// All days that have statistics, ascending. Costs two look-ups per day.
   Expected<std::vector<std::int32_t>> days();
-  /// Bytes of the pages in use, without the log.
+  /// Bytes of the pages in use, without the log and the positions of segments.
   Expected<std::int64_t> bytesInUse();
 
   /// How far a segment was folded; nothing when unknown. Consistent with the values read since
