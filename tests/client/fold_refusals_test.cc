@@ -1,23 +1,18 @@
 // What a fold refuses, limits, or leaves for the next fold.
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <climits>
-#include <csignal>
 #include <dirent.h>
 #include <dlfcn.h>
-#include <fstream>
 #include <pwd.h>
 #include <random>
 #include <sys/resource.h>
-#include <sys/stat.h>
 
 #include "base/bytes.h"
 #include "base/limits.h"
 #include "folding.h"
 #include "platform/linux/folding/segment_folder.h"
-#include "platform/linux/store/sqlite_schema.h"
 
 namespace {
 int readableEntries = INT_MAX;
@@ -241,8 +236,7 @@ TEST_F(FoldTest, ARowThatTakesNothingRefusesItsValuesAlone) {
   };
   run(recordAll);
   EXPECT_EQ(foldNow().refused, 0U);
-  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
-      .execute("UPDATE distributions SET count = 2 WHERE key = CAST('damaged' AS BLOB)");
+  connection().execute("UPDATE distributions SET count = 2 WHERE key = CAST('damaged' AS BLOB)");
   run(recordAll);
   const FoldReport report = foldNow();
   EXPECT_FALSE(report.failure) << *report.failure;
@@ -251,8 +245,7 @@ TEST_F(FoldTest, ARowThatTakesNothingRefusesItsValuesAlone) {
   EXPECT_NE(log.lines[0].find("; what was recorded for \"damaged\" on day "), std::string::npos)
       << log.lines[0];
   EXPECT_TRUE(segments().empty());
-  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
-      .execute("DELETE FROM distributions WHERE key = CAST('damaged' AS BLOB)");
+  connection().execute("DELETE FROM distributions WHERE key = CAST('damaged' AS BLOB)");
   look();
   EXPECT_EQ(scalar("count"), 2);
   EXPECT_EQ(figure("refused"), 1);
@@ -268,15 +261,10 @@ TEST_F(FoldTest, PositionsGoWithTheirSegments) {
   run([] { add(1); });
   EXPECT_EQ(foldNow().removed, 2U);
   EXPECT_EQ(held(), 2U);
-  const pid_t child = start([] {
-    add(1);
-    kill(getpid(), SIGSTOP);
-  });
-  waitpid(child, nullptr, WUNTRACED);
+  const pid_t child = startWriter();
   foldNow();
   EXPECT_EQ(held(), 1U);
-  kill(child, SIGKILL);
-  waitFor(child);
+  waitFor(child, SIGKILL);
 
   // A segment that is temporarily unreadable keeps its position.
   const std::string segment = segments().at(0);
@@ -399,32 +387,8 @@ TEST_F(FoldTest, SegmentsWhosePositionsWouldTakeTooMuchWait) {
   EXPECT_EQ(foldNow().removed, 9U);
 }
 
-TEST_F(FoldTest, ASegmentThatCannotBeOpenedNowIsNotRefused) {
-  run([] { add(1); });
-  const auto opened = SegmentFolder::open(DeviceRoot(root));
-  const auto listing = (*opened)->list();
-  rlimit files{};
-  getrlimit(RLIMIT_NOFILE, &files);
-  const rlimit none{0, files.rlim_max};
-  setrlimit(RLIMIT_NOFILE, &none);
-  const auto opening = (*opened)->openSegment(listing->segments.at(0));
-  setrlimit(RLIMIT_NOFILE, &files);
-  ASSERT_FALSE(opening);
-  EXPECT_EQ(opening.error().message,
-            "cannot open " + segments().at(0) +
-                ": Too many open files; raise the number of files that a process may open "
-                "(ulimit -n)");
-}
-
 TEST_F(FoldTest, AFolderReadInPartLosesNoPosition) {
-  pid_t children[2];
-  for (pid_t& child : children) {
-    child = start([] {
-      add(1);
-      kill(getpid(), SIGSTOP);
-    });
-    waitpid(child, nullptr, WUNTRACED);
-  }
+  const pid_t children[] = {startWriter(), startWriter()};
   EXPECT_EQ(foldNow().scalars, 2U);
   readableEntries = 3;  // ".", ".." and one of the segments
   const FoldReport report = foldNow();
@@ -433,10 +397,8 @@ TEST_F(FoldTest, AFolderReadInPartLosesNoPosition) {
   EXPECT_EQ(foldNow().scalars, 0U);
   look();
   EXPECT_EQ(scalar("count"), 2);
-  for (const pid_t child : children) {
-    kill(child, SIGKILL);
-    waitFor(child);
-  }
+  for (const pid_t child : children)
+    waitFor(child, SIGKILL);
 }
 
 TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {
@@ -452,9 +414,22 @@ TEST_F(FoldTest, TheFolderItselfAndItsRightsAreNamed) {
                 "segments");
   EXPECT_TRUE((*opened)->list(4)->isWhole);
 
+  // A segment that cannot be opened now is not refused.
+  const auto segment = (*opened)->list()->segments.at(0);
+  rlimit files{};
+  getrlimit(RLIMIT_NOFILE, &files);
+  const rlimit none{0, files.rlim_max};
+  setrlimit(RLIMIT_NOFILE, &none);
+  const auto opening = (*opened)->openSegment(segment);
+  setrlimit(RLIMIT_NOFILE, &files);
+  ASSERT_FALSE(opening);
+  EXPECT_EQ(opening.error().message,
+            "cannot open " + segments().at(0) +
+                ": Too many open files; raise the number of files that a process may open "
+                "(ulimit -n)");
   if (geteuid() == 0) {
     ASSERT_EQ(seteuid(65534), 0);
-    const auto closed = (*opened)->openSegment((*opened)->list()->segments.at(0));
+    const auto closed = (*opened)->openSegment(segment);
     ASSERT_EQ(seteuid(0), 0);
     const std::string name = segments().at(0).substr(folder.string().size() + 1);
     EXPECT_EQ(closed->refusal,

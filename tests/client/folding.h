@@ -4,11 +4,11 @@
 #include <algorithm>
 #include <cstdlib>
 #include <set>
-#include <sys/stat.h>
 
 #include "platform/linux/folding/recorded_history.h"
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
+#include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "recording.h"
@@ -29,6 +29,13 @@ class FoldTest : public Recording {
     chmod(folder.c_str(), 01777);
   }
 
+  /// A program that has added 1 and goes on.
+  static pid_t startWriter() {
+    return untilItStops(start([] {
+      add(1);
+      kill(getpid(), SIGSTOP);
+    }));
+  }
   FoldReport foldNow() {
     log.lines.clear();
     LinuxPlatform device(DeviceRoot(root), {.log = &log});
@@ -69,22 +76,9 @@ class FoldTest : public Recording {
     if (!*held) return;
     EXPECT_EQ(std::pair((*held)->first, (*held)->last), std::pair(*days.begin(), *days.rbegin()));
   }
-  std::int64_t figure(const char* name) {
-    const std::string key = std::string("com.norvane.brimhold.") + name;
-    std::int64_t sum = 0;  // dated by the machine's clock
-    for (const auto& [row, value] : scalars)
-      if (row.first == key) sum += value;
-    return sum;
-  }
-  /// All numbers from 0 up.
-  void expectEachOnce(std::size_t count) {
-    auto& values = records["series"];
-    std::sort(values.begin(), values.end());
-    ASSERT_EQ(values.size(), count);
-    std::size_t wrong = 0;
-    for (std::size_t i = 0; i < count; ++i)
-      if (values[i] != static_cast<double>(i)) ++wrong;
-    ASSERT_EQ(wrong, 0U);
+  std::int64_t figure(const char* name) { return sum(std::string("com.norvane.brimhold.") + name); }
+  SqliteConnection connection() {
+    return openStoreForWriting(store(), std::make_shared<BusyBudget>(1000));
   }
   std::filesystem::path store() { return LinuxPlatform(DeviceRoot(root)).store().path(); }
 

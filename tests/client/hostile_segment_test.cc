@@ -117,12 +117,10 @@ TEST_F(HostileSegment, EveryFieldMayHoldAnything) {
     for (const std::uint64_t word : {0ULL, 1ULL, 0x7fULL, 0xffffULL, 0x7fffffffULL, 0xffffffffULL,
                                      1ULL << 62, ~0ULL >> 1, 1ULL << 63, ~0ULL}) {
       write(field, word);
-      readAll();
-      boot = std::nullopt;
-      readAll(false);
-      boot = INT64_MAX;
-      readAll();
-      boot = 0;
+      for (const BootInstant instant : {BootInstant(0), BootInstant(INT64_MAX), BootInstant()}) {
+        boot = instant;
+        readAll(boot.has_value());
+      }
     }
     restore();
   }

@@ -2,9 +2,11 @@
 
 #include <algorithm>
 #include <cerrno>
+#include <cmath>
 #include <cstdlib>
 #include <ctime>
 #include <sys/stat.h>
+#include <thread>
 
 namespace {
 constexpr std::size_t kLargePage = 16'384;
@@ -111,6 +113,27 @@ Recording::~Recording() {
 const Keys& Recording::keys() {
   static const Keys keys;
   return keys;
+}
+
+void Recording::recordInThreads(int threads, int perThread, int first) {
+  std::vector<std::jthread> all;
+  for (int thread = 0; thread < threads; ++thread)
+    all.emplace_back([=] {
+      for (int i = 0; i < perThread; ++i) {
+        add(1);
+        record(first + thread * perThread + i);
+      }
+    });
+}
+
+void Recording::expectEachOnce(std::size_t count, std::uint64_t missing) {
+  auto& values = records["series"];
+  std::sort(values.begin(), values.end());
+  ASSERT_EQ(values.size() + missing, count);
+  ASSERT_EQ(std::ranges::adjacent_find(values), values.end());
+  ASSERT_TRUE(std::ranges::all_of(values, [&](double value) {
+    return value >= 0 && value < static_cast<double>(count) && value == std::trunc(value);
+  }));
 }
 
 std::vector<std::string> Recording::segments() const {

@@ -65,10 +65,17 @@ inline pid_t start(const std::function<void()>& program) {
   }
   return child;
 }
-inline int waitFor(pid_t child) {
+/// Waits for the end of a child, to which it first sends the signal, if any.
+inline int waitFor(pid_t child, int signal = 0) {
   int status = -1;
+  if (signal != 0) kill(child, signal);
   waitpid(child, &status, 0);
   return status;
+}
+/// Waits until a child stops itself.
+inline pid_t untilItStops(pid_t child) {
+  waitpid(child, nullptr, WUNTRACED);
+  return child;
 }
 inline void run(const std::function<void()>& program) {
   EXPECT_EQ(waitFor(start(program)), 0);
@@ -129,6 +136,18 @@ class Recording : public testing::Test, public SegmentSink {
   void fold();
   SegmentWriter writerOf(const std::string& segment) const;
 
+  /// Adds 1 and records a number, in all threads at the same time: all numbers from `first` up.
+  static void recordInThreads(int threads, int perThread, int first = 0);
+  /// The numbers from 0 up are in the series, each once, except `missing` of them.
+  void expectEachOnce(std::size_t count, std::uint64_t missing = 0);
+
+  /// A key's values of all days. Programs use the machine's clock.
+  std::int64_t sum(const std::string& key) const {
+    std::int64_t all = 0;
+    for (const auto& [row, value] : scalars)
+      if (row.first == key) all += value;
+    return all;
+  }
   std::int64_t& scalar(const char* key, std::int64_t day = kToday) {
     return scalars[{key, static_cast<std::int32_t>(day)}];
   }
