@@ -1,6 +1,5 @@
 
 #include <csignal>
-#include <fcntl.h>
 #include <sys/inotify.h>
 
 #include "device_services.h"

@@ -29,11 +29,15 @@ class QuickFileSystem final : public FileSystem {
   int syncFile(int) override { return 0; }
 };
 
+inline FileSystem& quickFiles() {
+  static QuickFileSystem files;
+  return files;
+}
+
 /// The services of one process on a device.
 struct ProcessServices {
-  ProcessServices(const DeviceRoot& root, FileSystem& fileSystem)
+  explicit ProcessServices(const DeviceRoot& root, FileSystem& fileSystem = quickFiles())
       : preferences(root, fileSystem, coding, clock, log) {}
-  explicit ProcessServices(const DeviceRoot& root) : ProcessServices(root, files) {}
 
   KeptLog log;
   QuickFileSystem files;

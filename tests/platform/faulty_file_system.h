@@ -145,4 +145,22 @@ class FaultyFileSystem final : public FileSystem {
   std::map<std::string, std::map<std::string, Inode>> flushedNames_;  // by folder
 };
 
+/// Lets each fault strike each system call of `work` on a device of its own, as `prepare` left it.
+inline void strikeEachCall(
+    const std::function<void(const TemporaryRoot&)>& prepare,
+    const std::function<void(const TemporaryRoot&, FaultyFileSystem&)>& work) {
+  for (const auto fault : FaultyFileSystem::kFaults) {
+    bool hasStruck = true;
+    for (int call = 1; hasStruck && !testing::Test::HasFatalFailure(); ++call) {
+      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
+      ASSERT_LT(call, 200);
+      const TemporaryRoot device;
+      prepare(device);
+      FaultyFileSystem faulty(device.root.path("/"), fault, call);
+      work(device, faulty);
+      hasStruck = faulty.hasStruck();
+    }
+  }
+}
+
 }  // namespace tavrel

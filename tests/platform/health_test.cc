@@ -1,6 +1,4 @@
 // Health of drives: log pages, texts from sysfs, growth, and whole readings below a device root.
-#include <filesystem>
-#include <gtest/gtest.h>
 
 #include "platform/linux/health/ata_smart.h"
 #include "platform/linux/health/drives.h"
@@ -249,12 +247,25 @@ class Answers final : public DeviceCommands {
   std::function<void()> whileAsked;
 };
 
-// Accepts readings, which are in memory, but no file on flash.
-class FullFlash final : public FileSystem {
+// Counts how often each file is put in place, and lets a test interfere.
+class WatchedFiles final : public FileSystem {
+ public:
+  std::map<std::string, int> written;
+  std::function<void()> beforeLock;  // called once, before the remembered counters are locked
+  bool isFlashFull = false;          // readings, which are in memory, are accepted all the same
+
+ private:
+  int openFile(const char* path, int flags, mode_t mode) override {
+    if (std::string_view(path).ends_with("/health/.lock")) {
+      if (const auto now = std::exchange(beforeLock, nullptr)) now();
+    }
+    return FileSystem::openFile(path, flags, mode);
+  }
   int renameFile(const char* from, const char* to) override {
-    if (!std::string_view(to).ends_with(kMemoryFile)) return FileSystem::renameFile(from, to);
+    ++written[to];
     errno = ENOSPC;
-    return -1;
+    const bool fails = isFlashFull && std::string_view(to).ends_with(kMemoryFile);
+    return fails ? -1 : FileSystem::renameFile(from, to);
   }
 };
 
@@ -285,7 +296,18 @@ class HealthReaderTest : public testing::Test, protected TemporaryRoot {
           *plist::writeXml(plist::Dictionary{{std::string(kLastRunDayKey), day}}));
   }
 
-  FileSystem files;
+  /// Reads drives on one day, and leaves the state of the next day's run.
+  void startWith(const Lines& names) {
+    for (const std::string& name : names)
+      addNvme(name, name);
+    run(1);
+    ASSERT_TRUE(readAll(1000));
+    run(2);
+  }
+  /// The growth of a drive's written bytes in its last reading.
+  std::int64_t grown(const char* name) { return valuesOf(readings()[name].growth)["written"]; }
+
+  WatchedFiles files;
   KeptLog log;
   Answers answers;
 };
@@ -361,25 +383,13 @@ TEST_F(HealthReaderTest, AsksForTheOcpLogOncePerFirmware) {
   EXPECT_EQ(decodeMemory(asBytes(memory))->drives.size(), 2U) << "drives of one serial number";
 }
 
-// Counts what is written, a line for each file.
-class CountedFiles final : public FileSystem {
-  int renameFile(const char* from, const char* to) override {
-    ++written[to];
-    return FileSystem::renameFile(from, to);
-  }
-
- public:
-  std::map<std::string, int> written;
-};
-
 TEST_F(HealthReaderTest, FlashThatNeedsNoCommandCostsOneWriting) {
   addNvme("nvme0", "S1");
   for (const char* name : {"mtd0", "mtd1", "mtd2"})
     write(std::string("/sys/class/mtd/") + name + "/ecc_failures", "2\n");
-  CountedFiles counted;
-  ASSERT_TRUE(HealthReader(root, counted, answers, log).readAll(1000));
-  EXPECT_EQ(counted.written[root.path(kMemoryFile)], 2);
-  EXPECT_EQ(counted.written.size(), 5U);
+  ASSERT_TRUE(readAll(1000));
+  EXPECT_EQ(files.written[root.path(kMemoryFile)], 2);
+  EXPECT_EQ(files.written.size(), 5U);
 }
 
 TEST_F(HealthReaderTest, ADriveThatIsBeingReadKeepsNoOtherWaiting) {
@@ -396,11 +406,7 @@ TEST_F(HealthReaderTest, ADriveThatIsBeingReadKeepsNoOtherWaiting) {
 }
 
 TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
-  for (const char* name : {"nvme0", "nvme1", "nvme2"})
-    addNvme(name, name);
-  run(1);
-  ASSERT_TRUE(readAll(1000));
-  run(2);
+  startWith({"nvme0", "nvme1", "nvme2"});
   answers.whileAsked = [this] {
     run(3);
     put(*answers.smart, 48, {4});
@@ -414,22 +420,9 @@ TEST_F(HealthReaderTest, ALateAnswerSpoilsNoLaterReading) {
   EXPECT_EQ(readings()["nvme1"].time, 3000);
   EXPECT_EQ(readings()["nvme2"].time, 2000) << "the later run has not read it";
   EXPECT_EQ(readings()["mtd0"].time, 3000) << "the drive came after the beginning of this run";
-  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 2 * 512'000);
-  EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 2 * 512'000);
+  EXPECT_EQ(grown("nvme0"), 2 * 512'000);
+  EXPECT_EQ(grown("nvme1"), 2 * 512'000);
 }
-
-// Lets something happen right before the remembered counters are locked.
-class InterruptedFiles final : public FileSystem {
-  int openFile(const char* path, int flags, mode_t mode) override {
-    if (std::string_view(path).ends_with("/health/.lock")) {
-      if (const auto now = std::exchange(beforeLock, nullptr)) now();
-    }
-    return FileSystem::openFile(path, flags, mode);
-  }
-
- public:
-  std::function<void()> beforeLock;
-};
 
 TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
   const std::string counter = "/sys/class/mtd/mtd0/corrected_bits";
@@ -438,12 +431,11 @@ TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
     write(counter, "1000000\n");
     ASSERT_TRUE(readAll(1000));
     run(2000);
-    InterruptedFiles late;
-    late.beforeLock = [&] {
+    files.beforeLock = [&] {
       write(counter, "1000001\n");
       EXPECT_TRUE(readAll(other));
     };
-    ASSERT_TRUE(HealthReader(root, late, answers, log).readAll(2000));
+    ASSERT_TRUE(readAll(2000));
     Reading reading = readings()["mtd0"];
     EXPECT_EQ(reading.time, std::max<std::int64_t>(other, 2000));
     EXPECT_EQ(valuesOf(reading.figures), (Values{{"corrected_bits", 1'000'001}}));
@@ -452,28 +444,21 @@ TEST_F(HealthReaderTest, NoEarlierFiguresReplaceThoseOfAnotherRun) {
 }
 
 TEST_F(HealthReaderTest, ADriveIsLockedUntilItsReadingIsStored) {
-  addNvme("nvme0", "S1");
-  run(1);
-  ASSERT_TRUE(readAll(1000));
-  run(2);
+  startWith({"nvme0"});
   put(*answers.smart, 48, {3});
-  InterruptedFiles late;
-  late.beforeLock = [this] {
+  files.beforeLock = [this] {
     put(*answers.smart, 48, {4});
     EXPECT_FALSE(readAll(3000)) << "nvme0 is being read";
   };
-  ASSERT_TRUE(HealthReader(root, late, answers, log).readAll(2000));
-  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000);
+  ASSERT_TRUE(readAll(2000));
+  EXPECT_EQ(grown("nvme0"), 512'000);
 }
 
 TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
-  addNvme("nvme0", "S1");
-  run(1);
-  ASSERT_TRUE(readAll(1000));
-  run(2);
+  startWith({"nvme0"});
   put(*answers.smart, 48, {5});
   ASSERT_TRUE(readAll(2000));
-  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 3 * 512'000);
+  EXPECT_EQ(grown("nvme0"), 3 * 512'000);
 
   write("/sys/devices/pci/power/runtime_status", "suspended\n");  // the drive's parent device
   answers.asked.clear();
@@ -498,32 +483,27 @@ TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
 }
 
 TEST_F(HealthReaderTest, AKilledReaderTellsNoGrowthTwice) {
-  addNvme("nvme0", "S1");
-  addNvme("nvme1", "S2");
-  run(1);
-  ASSERT_TRUE(readAll(1000));
+  startWith({"nvme0", "nvme1"});
   answers.killer = "nvme1";
   for (const unsigned day : {2U, 3U, 4U}) {
     run(day);
     put(*answers.smart, 48, {day + 1});
     EXPECT_THROW(readAll(1000 + day), std::bad_alloc);
-    EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000) << day;
+    EXPECT_EQ(grown("nvme0"), 512'000) << day;
   }
   answers.killer = "none";
   run(5);
-  FullFlash full;
-  EXPECT_FALSE(HealthReader(root, full, answers, log).readAll(5000));
+  files.isFlashFull = true;
+  EXPECT_FALSE(readAll(5000));
   EXPECT_EQ(readings()["nvme1"].time, 5000);
   EXPECT_TRUE(readings()["nvme1"].growth.empty()) << "it could not be remembered";
+  files.isFlashFull = false;
   ASSERT_TRUE(readAll(6000));
-  EXPECT_EQ(valuesOf(readings()["nvme1"].growth)["written"], 3 * 512'000);
+  EXPECT_EQ(grown("nvme1"), 3 * 512'000);
 }
 
 TEST_F(HealthReaderTest, KeepsReadingsAndGrowthThroughFailures) {
-  addNvme("nvme0", "S1");
-  run(1);
-  ASSERT_TRUE(readAll(1000));
-  run(2);
+  startWith({"nvme0"});
   put(*answers.smart, 48, {3});
   const std::string state =
       root.path("/var/mobile/Library/Preferences/com.norvane.tallied.tavrel.plist");
@@ -544,34 +524,26 @@ TEST_F(HealthReaderTest, KeepsReadingsAndGrowthThroughFailures) {
                                   ": Not a directory"}));
   std::filesystem::remove(root.path("/sys/class/mtd"));
   ASSERT_TRUE(readAll(4000));
-  EXPECT_EQ(valuesOf(readings()["nvme0"].growth)["written"], 512'000);
+  EXPECT_EQ(grown("nvme0"), 512'000);
 }
 
 TEST(HealthTest, Verdicts) {
-  struct Case {
+  constexpr DriveKind kNvme = DriveKind::Nvme;
+  const struct {
     DriveKind kind;
     Values figures;
-    std::string error;
     const char* word;
     int problems;
-  };
-  const Case cases[] = {
-      {DriveKind::Nvme,
-       {{"used_pct", 99}, {"spare_pct", 10}, {"spare_threshold_pct", 10}},
-       "",
-       "good",
-       0},
-      {DriveKind::Nvme, {{"used_pct", 255}}, "", "worn", kWorn},
-      {DriveKind::Nvme, {{"spare_pct", 9}, {"spare_threshold_pct", 10}}, "", "worn", kWorn},
-      {DriveKind::Nvme,
-       {{"critical_warning", 4}, {"media_errors", 1}},
-       "",
-       "failing",
-       kFailing | kErrors},
-      {DriveKind::Ata, {{"smart_good", 0}}, "", "failing", kFailing},
-      {DriveKind::Emmc, {{"pre_eol", 3}}, "", "failing", kFailing | kWorn},
-      {DriveKind::Nvme, {}, "no", "unknown", kUnread}};
-  for (const Case& each : cases) {
+    std::string error{};
+  } cases[] = {
+      {kNvme, {{"used_pct", 99}, {"spare_pct", 10}, {"spare_threshold_pct", 10}}, "good", 0},
+      {kNvme, {{"used_pct", 255}}, "worn", kWorn},
+      {kNvme, {{"spare_pct", 9}, {"spare_threshold_pct", 10}}, "worn", kWorn},
+      {kNvme, {{"critical_warning", 4}, {"media_errors", 1}}, "failing", kFailing | kErrors},
+      {DriveKind::Ata, {{"smart_good", 0}}, "failing", kFailing},
+      {DriveKind::Emmc, {{"pre_eol", 3}}, "failing", kFailing | kWorn},
+      {kNvme, {}, "unknown", kUnread, "no"}};
+  for (const auto& each : cases) {
     Reading reading;
     reading.kind = each.kind;
     reading.error = each.error;

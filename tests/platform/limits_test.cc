@@ -15,10 +15,11 @@ namespace {
 constexpr const char* kPending = "/var/mobile/Library/Logs/Submission/pending/";
 
 using Days = std::vector<std::int32_t>;
+using plist::Dictionary;
 
 class LimitsTest : public StoreTest {
  protected:
-  void limit(const plist::Dictionary& content) {
+  void limit(const Dictionary& content) {
     write("/etc/tavrel/limits.plist", *coding.encodeXml(content));
   }
   TidyReport tidy() { return Tidy(root, files, coding, preferences, store).run(); }
@@ -40,7 +41,7 @@ class LimitsTest : public StoreTest {
     std::iota(days.begin(), days.end(), first);
     return days;
   }
-  void setLastRun(std::int32_t day) {
+  void setLastRun(const plist::Value& day) {
     preferences.ZTXPreferencesSetValue(kLastRunDayKey, day, kTavrelDomain);
   }
   std::int64_t statistic(std::string_view key) {
@@ -56,99 +57,79 @@ class LimitsTest : public StoreTest {
 
 TEST_F(LimitsTest, NamesTheFirstFaultOfTheFileAndRemovesNothing) {
   record(range(kToday - 200, kToday));
+  const auto one = [](const char* kind, const char* name, const plist::Value& value) {
+    return Dictionary{{kind, Dictionary{{name, value}}}};
+  };
   const std::pair<plist::Value, const char*> kCases[] = {
-      {plist::Dictionary{{"Stores", plist::Dictionary::create()}},
+      {Dictionary{{"Stores", Dictionary::create()}},
        "\"Stores\" is not a limit; they are Store, Pending, Outbox, Withheld, Refused, Records, "
        "EccEvents, SetAside"},
-      {plist::Dictionary{{"Store", 5}}, "Store must be a dictionary"},
-      {plist::Dictionary{{"Store", plist::Dictionary{{"Day", 5}}}},
-       "Store has no limit \"Day\"; it has Days and Bytes"},
-      {plist::Dictionary{{"SetAside", plist::Dictionary{{"Days", 5}}}},
-       "SetAside has no limit \"Days\"; it has Bytes"},
-      {plist::Dictionary{{"Store", plist::Dictionary{{"Days", 0}}}},
-       "Store/Days must be an integer from 1 to 36500"},
-      {plist::Dictionary{{"Store", plist::Dictionary{{"Days", 2.5}}}},
-       "Store/Days must be an integer from 1 to 36500"},
-      {plist::Dictionary{{"Outbox", plist::Dictionary{{"Bytes", 65535}}}},
+      {Dictionary{{"Store", 5}}, "Store must be a dictionary"},
+      {one("Store", "Day", 5), "Store has no limit \"Day\"; it has Days and Bytes"},
+      {one("SetAside", "Days", 5), "SetAside has no limit \"Days\"; it has Bytes"},
+      {one("Store", "Days", 0), "Store/Days must be an integer from 1 to 36500"},
+      {one("Store", "Days", 2.5), "Store/Days must be an integer from 1 to 36500"},
+      {one("Outbox", "Bytes", 65535),
        "Outbox/Bytes must be an integer from 65536 to 1099511627776"},
       {plist::Array{1}, "it is not a dictionary"}};
   const std::string path = root.path("/etc/tavrel/limits.plist");
+  const auto expectFault = [&](std::string fault) {
+    fault = path + ": " + fault + ": nothing is removed until it is repaired";
+    EXPECT_EQ(tidy().failures, Lines{fault});
+    EXPECT_EQ(contentOf(root.path(kTidyFailuresFile)), fault + "\n");
+  };
   for (const auto& [content, fault] : kCases) {
     write("/etc/tavrel/limits.plist", *coding.encodeXml(content));
-    EXPECT_EQ(tidy().failures,
-              Lines{path + ": " + fault + ": nothing is removed until it is repaired"});
+    expectFault(fault);
   }
-  EXPECT_EQ(contentOf(root.path(kTidyFailuresFile)),
-            path + ": it is not a dictionary: nothing is removed until it is repaired\n");
   std::filesystem::remove(path);
   std::filesystem::create_symlink("nowhere", path);
-  EXPECT_EQ(tidy().failures,
-            Lines{path + ": it is a link that leads nowhere: nothing is removed until "
-                         "it is repaired"});
+  expectFault("it is a link that leads nowhere");
   std::filesystem::remove_all(root.path("/etc/tavrel"));
   std::filesystem::create_symlink("nowhere", root.path("/etc/tavrel"));
-  EXPECT_EQ(tidy().failures,
-            Lines{path + ": its folder is a link that leads nowhere, or a file: nothing is removed "
-                         "until it is repaired"});
+  expectFault("its folder is a link that leads nowhere, or a file");
   std::filesystem::remove(root.path("/etc/tavrel"));
-  limit({{"Store", plist::Dictionary{{"Days", 36'500}}}});
+  limit({{"Store", Dictionary{{"Days", 36'500}}}});
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_FALSE(std::filesystem::exists(root.path(kTidyFailuresFile)));
   std::filesystem::permissions(path, std::filesystem::perms(0620));
-  EXPECT_EQ(
-      tidy().failures,
-      Lines{path + ": users other than root may write it: make root its owner and set mode 0644: "
-                   "nothing is removed until it is repaired"});
+  expectFault("users other than root may write it: make root its owner and set mode 0644");
   EXPECT_EQ(daysHeld().size(), 201U);
 }
 
 TEST_F(LimitsTest, RemovesTheOldestDaysAndThoseAfterTomorrowFirst) {
-  limit({{"Store", plist::Dictionary{{"Days", 3}}}});
-  struct Case {
+  limit({{"Store", Dictionary{{"Days", 3}}}});
+  constexpr std::int32_t k1970 = -kToday;
+  const struct {
     const char* what;
-    std::int32_t today;
+    std::int32_t today;  // this and all other days count from kToday
     std::optional<std::int32_t> lastRun;
-    Days held;
-    Days left;
+    Days held, left;
+  } kCases[] = {
+      {"the oldest go", 0, -1, range(-9, 0), range(-2, 0)},
+      {"yesterday waits for its run", 0, -2, {-9, -1, 0, k1970 + 5, k1970 + 6}, {-9, -1, 0}},
+      {"days of a clock that was ahead go first", 0, -1, {-3, -2, -1, 0, 2, 3650}, {-2, -1, 0}},
+      {"tomorrow counts as today's neighbour", 0, -2, {-1, 0, 1, -7}, range(-1, 1)},
+      {"a jump ahead costs one day a day", 3650, 3649, {-2, -1, 0, 3650}, {-1, 0, 3650}},
+      {"in 1970 the next run's day stays",
+       k1970 + 5,
+       -3,
+       {k1970 + 2, k1970 + 5, -2, -1},
+       {k1970 + 5, -2, -1}},
+      {"nothing is due", 0, std::nullopt, {-3000, 0}, {-3000, 0}}};
+  const auto dated = [](Days days) {
+    for (std::int32_t& day : days)
+      day += kToday;
+    return days;
   };
-  const Case kCases[] = {
-      {"the oldest go", kToday, kToday - 1, range(kToday - 9, kToday), range(kToday - 2, kToday)},
-      {"yesterday waits for its run",
-       kToday,
-       kToday - 2,
-       {kToday - 9, kToday - 1, kToday, 5, 6},
-       {kToday - 9, kToday - 1, kToday}},
-      {"days of a clock that was ahead go before others",
-       kToday,
-       kToday - 1,
-       {kToday - 3, kToday - 2, kToday - 1, kToday, kToday + 2, kToday + 3650},
-       {kToday - 2, kToday - 1, kToday}},
-      {"tomorrow counts as today's neighbour",
-       kToday,
-       kToday - 2,
-       {kToday - 1, kToday, kToday + 1, kToday - 7},
-       range(kToday - 1, kToday + 1)},
-      {"a clock that jumps ahead costs one day a day",
-       kToday + 3650,
-       kToday + 3649,
-       {kToday - 2, kToday - 1, kToday, kToday + 3650},
-       {kToday - 1, kToday, kToday + 3650}},
-      {"a clock in 1970 keeps the day that the next run would have reported",
-       5,
-       kToday - 3,
-       {2, 5, kToday - 2, kToday - 1},
-       {5, kToday - 2, kToday - 1}},
-      {"nothing is due", kToday, std::nullopt, {kToday - 3000, kToday}, {kToday - 3000, kToday}}};
-  for (const Case& each : kCases) {
+  for (const auto& each : kCases) {
+    SCOPED_TRACE(each.what);
     std::filesystem::remove_all(root.path("/var/mobile/Library/Brimhold"));
-    record(each.held);
-    clock.time = plist::Date::since1970(each.today * 86400.0 + 5);
-    preferences.ZTXPreferencesSetValue(
-        kLastRunDayKey, each.lastRun ? plist::Value(*each.lastRun) : plist::Value(), kTavrelDomain);
-    EXPECT_EQ(tidy().failures, Lines{}) << each.what;
-    // The count of removed items is dated today.
-    Days left = daysHeld();
-    EXPECT_EQ(left, each.left) << each.what;
+    record(dated(each.held));
+    clock.time = plist::Date::since1970((kToday + each.today) * 86400.0 + 5);
+    setLastRun(each.lastRun ? plist::Value(kToday + *each.lastRun) : plist::Value());
+    EXPECT_EQ(tidy().failures, Lines{});
+    EXPECT_EQ(daysHeld(), dated(each.left));  // the count of removed items is dated today
   }
 }
 
@@ -158,7 +139,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   // The state that a killed erasure leaves.
   sql("CREATE TABLE erased (zeros BLOB); INSERT INTO erased VALUES (zeroblob(999999))");
   ASSERT_EQ(sql("PRAGMA auto_vacuum"), Lines{"2"});
-  limit({{"Store", plist::Dictionary{{"Bytes", 1 << 20}}}});
+  limit({{"Store", Dictionary{{"Bytes", 1 << 20}}}});
   const TidyReport report = tidy();
   EXPECT_EQ(report.failures, Lines{});
   const Days left = daysHeld();
@@ -175,7 +156,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
   // Positions of segments belong to no day.
   sql("INSERT INTO segments VALUES (7, x'00', zeroblob(999999))");
   EXPECT_EQ(tidy().kinds[0].removed, 0);
-  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  limit({{"Store", Dictionary{{"Days", 1}}}});
   tidy();
   EXPECT_EQ(daysHeld(), Days{kToday});
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.store.days"), 99);
@@ -184,7 +165,7 @@ TEST_F(LimitsTest, GivesSpaceBackAndCountsWhatWent) {
 
 TEST_F(LimitsTest, KeepsDaysThatWaitWhateverTheirSize) {
   record({kToday - 1, kToday}, 20'000);
-  limit({{"Store", plist::Dictionary{{"Days", 1}, {"Bytes", 65536}}}});
+  limit({{"Store", Dictionary{{"Days", 1}, {"Bytes", 65536}}}});
   EXPECT_FALSE(tidy().kinds[0].exceeds) << "the run of yesterday frees that day";
   EXPECT_EQ(daysHeld(), (Days{kToday - 1, kToday}));
   setLastRun(kToday - 1);
@@ -198,7 +179,7 @@ TEST_F(LimitsTest, ConvertsAStoreThatCannotShrinkOnce) {
   sql("PRAGMA auto_vacuum = NONE; VACUUM");
   sql("PRAGMA application_id = 77");
   const auto before = fs::file_size(store.path());
-  limit({{"Store", plist::Dictionary{{"Days", 4}}}});
+  limit({{"Store", Dictionary{{"Days", 4}}}});
   EXPECT_EQ(tidy().failures, Lines{});
   EXPECT_EQ(sql("PRAGMA auto_vacuum"), Lines{"2"});
   EXPECT_LT(fs::file_size(store.path()), before / 5);
@@ -208,7 +189,7 @@ TEST_F(LimitsTest, ConvertsAStoreThatCannotShrinkOnce) {
 
 TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
   setLastRun(kToday - 1);
-  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  limit({{"Store", Dictionary{{"Days", 1}}}});
   for (int commits = 0; commits < 3; ++commits)
     record({kToday - 2}, 400'000);
   record({kToday});
@@ -221,7 +202,7 @@ TEST_F(LimitsTest, RemovesADayOfRunsThatDoNotFitOneStep) {
 
 TEST_F(LimitsTest, RunsThatContradictThemselvesTakeNothingOfOthers) {
   setLastRun(kToday - 1);
-  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  limit({{"Store", Dictionary{{"Days", 1}}}});
   // The first chunk, twice the chunks, the values: 33 chunks of 3, 2^61 of one, none of 3.
   for (const char* runs : {"004203", "0080808080808080804001", "000003"}) {
     for (const bool erases : {false, true}) {
@@ -246,7 +227,7 @@ TEST_F(LimitsTest, RunsThatContradictThemselvesTakeNothingOfOthers) {
 
 TEST_F(LimitsTest, RowsOutOfOrderEndTheRemoval) {
   setLastRun(kToday - 1);
-  limit({{"Store", plist::Dictionary{{"Days", 1}}}});
+  limit({{"Store", Dictionary{{"Days", 1}}}});
   const std::string where = "statistics store " + store.path() + ": ";
   for (const bool areScalars : {true, false}) {
     auto batch = store.beginBatch();
@@ -298,8 +279,8 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb-kept-damaged", std::string(70'000, 'c'));
   write("/var/lib/tavrel/ecc-events/c.event.unusable", std::string(70'000, 'u'));
   write("/var/mobile/Library/Preferences/com.example.corrupt-x.plist", std::string(70'000, 'p'));
-  const plist::Dictionary small{{"Bytes", 65536}};
-  limit({{"Pending", plist::Dictionary{{"Bytes", 100'000}}},
+  const Dictionary small{{"Bytes", 65536}};
+  limit({{"Pending", Dictionary{{"Bytes", 100'000}}},
          {"Records", small},
          {"EccEvents", small},
          {"SetAside", small}});
@@ -322,7 +303,7 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   // The newest log stays, however small the limit; the limit of days works like that of bytes.
   fileLog("log-tallied-20261127T000009Z-00000005", 400'000);
   fileLog("StorageStatus-20261126T000009Z-00000006", 1);
-  limit({{"Pending", plist::Dictionary{{"Days", 1}}}});
+  limit({{"Pending", Dictionary{{"Days", 1}}}});
   EXPECT_EQ(tidy().kinds[1].removed, 2);
   limit({{"Pending", small}});
   EXPECT_EQ(tidy().kinds[1].removed, 1);
@@ -348,7 +329,7 @@ TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {
   } stuck(root.path("/var/mobile/Library/Logs/Submission/.lock"));
   for (int day = 24; day <= 27; ++day)
     write(format("%sS-202611%dT000000Z-00000000.log", kPending, day), "L");
-  limit({{"Pending", plist::Dictionary{{"Days", 2}}}});
+  limit({{"Pending", Dictionary{{"Days", 2}}}});
   const TidyReport report = Tidy(root, stuck, coding, preferences, store).run();
   EXPECT_EQ(report.failures,
             Lines{"cannot remove " + root.path(kPending) +
@@ -361,40 +342,34 @@ TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {
 }
 
 TEST(LimitsFaults, LogsHaveTheirMetadataAfterEveryFault) {
-  for (const auto fault : FaultyFileSystem::kFaults) {
-    int call = 1;
-    for (bool struck = true; struck; ++call) {
-      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
-      const TemporaryRoot device;
-      for (int log = 1; log <= 4; ++log) {
-        const std::string name = format("%slog-tallied-2026112%dT000000Z-00000000", kPending, log);
-        device.write(name + ".log", "L");
-        device.write(name + ".metadata.plist", "M");
-      }
-      FaultyFileSystem faulty(device.root.path("/"), fault, call);
-      ProcessServices process(device.root, faulty);
-      auto kept = KeptFiles::list(Kept::Pending, device.root, faulty, kToday);
-      ASSERT_TRUE(kept);
-      kept->trim({2, 1 << 20});
-      struck = faulty.hasStruck();
-      faulty.settle();
-
-      const auto names = *process.files.list(device.root.path(kPending));
-      std::size_t logs = 0;
-      for (const std::string& name : names) {
-        if (!name.ends_with(".log")) continue;
-        ++logs;
-        EXPECT_TRUE(
-            std::ranges::binary_search(names, name.substr(0, name.size() - 4) + ".metadata.plist"))
-            << name;
-      }
-      EXPECT_GE(logs, 2U);
-      auto later = KeptFiles::list(Kept::Pending, device.root, process.files, kToday);
-      later->trim({2, 1 << 20});
-      EXPECT_EQ(process.files.list(device.root.path(kPending))->size(), 4U);
-      ASSERT_LT(call, 50);
+  const auto prepare = [](const TemporaryRoot& device) {
+    for (int log = 1; log <= 4; ++log) {
+      const std::string name = format("%slog-tallied-2026112%dT000000Z-00000000", kPending, log);
+      device.write(name + ".log", "L");
+      device.write(name + ".metadata.plist", "M");
     }
-  }
+  };
+  strikeEachCall(prepare, [](const TemporaryRoot& device, FaultyFileSystem& faulty) {
+    auto kept = KeptFiles::list(Kept::Pending, device.root, faulty, kToday);
+    ASSERT_TRUE(kept);
+    kept->trim({2, 1 << 20});
+    faulty.settle();
+
+    QuickFileSystem files;
+    const auto names = *files.list(device.root.path(kPending));
+    std::size_t logs = 0;
+    for (const std::string& name : names) {
+      if (!name.ends_with(".log")) continue;
+      ++logs;
+      EXPECT_TRUE(
+          std::ranges::binary_search(names, name.substr(0, name.size() - 4) + ".metadata.plist"))
+          << name;
+    }
+    EXPECT_GE(logs, 2U);
+    auto later = KeptFiles::list(Kept::Pending, device.root, files, kToday);
+    later->trim({2, 1 << 20});
+    EXPECT_EQ(files.list(device.root.path(kPending))->size(), 4U);
+  });
 }
 
 }  // namespace

@@ -1,6 +1,5 @@
 // The locks with which programs take turns: no other user can hold one of them.
 
-#include <fcntl.h>
 #include <grp.h>
 #include <signal.h>
 #include <sys/file.h>

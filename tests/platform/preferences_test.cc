@@ -28,9 +28,10 @@ struct Process : ProcessServices {
   }
 };
 
-TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
-  const TemporaryRoot device;
-  Process here(device.root), there(device.root);
+struct PreferencesTest : testing::Test, TemporaryRoot {};
+
+TEST_F(PreferencesTest, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
+  Process here(root), there(root);
   EXPECT_EQ(here.get("a"), "(null)");
   const plist::Array list{1, 2};
   here.set("a", list);
@@ -51,12 +52,12 @@ TEST(Preferences, AreSeenAtOnceHereAndElsewhereOnceSynchronised) {
   EXPECT_TRUE(there.synchronize());
   EXPECT_EQ(there.all(), R"({"b":true,"c":"text"})");
 
-  Process(device.root).set("d", std::int64_t{-5});
-  EXPECT_EQ(Process(device.root).get("d"), "-5");
+  Process(root).set("d", std::int64_t{-5});
+  EXPECT_EQ(Process(root).get("d"), "-5");
   EXPECT_TRUE(here.log.lines.empty() && there.log.lines.empty());
 }
 
-TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
+TEST_F(PreferencesTest, AFileThatIsNoPropertyListIsSetAside) {
   for (const std::string content : {"", "garbage", "<plist version=\"1.0\"><array/></plist>"}) {
     const TemporaryRoot device;
     device.write(kFile, content);
@@ -78,17 +79,16 @@ TEST(Preferences, AFileThatIsNoPropertyListIsSetAside) {
   }
 }
 
-TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
-  const TemporaryRoot device;
-  fs::create_directories(device.root.path(kFile));  // a folder where the file should be
-  Process process(device.root);
+TEST_F(PreferencesTest, WhatCannotBeWrittenIsKeptAndToldOnce) {
+  fs::create_directories(root.path(kFile));  // a folder where the file should be
+  Process process(root);
   process.set("a", 1);
   EXPECT_FALSE(process.synchronize());
   EXPECT_FALSE(process.synchronize());
   EXPECT_EQ(process.log.lines,
-            Lines{"cannot use " + device.root.path(kFile) + ": it is a folder; move it away"});
+            Lines{"cannot use " + root.path(kFile) + ": it is a folder; move it away"});
   EXPECT_EQ(process.get("a"), "1");
-  fs::remove(device.root.path(kFile));
+  fs::remove(root.path(kFile));
   EXPECT_TRUE(process.synchronize());
 
   // One value that cannot be encoded does not hold up the others.
@@ -107,15 +107,14 @@ TEST(Preferences, WhatCannotBeWrittenIsKeptAndToldOnce) {
   EXPECT_EQ(process.log.lines.size(), 4U);
   EXPECT_TRUE(process.log.says(
       "cannot write preference \"large8\" of domain com.example.domain: the file "));
-  Process later(device.root);
+  Process later(root);
   EXPECT_EQ(later.get("gate") + later.get("good"), "207832");
   EXPECT_EQ(later.get("large7").size(), 1007U << 10);
   EXPECT_EQ(later.get("large8"), "(null)");
 }
 
-TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
-  const TemporaryRoot device;
-  Process process(device.root);
+TEST_F(PreferencesTest, ADomainThatCannotNameAFileIsRefused) {
+  Process process(root);
   for (const std::string name : {"", ".hidden", "../../etc/passwd", "a/b", "line\nend"}) {
     process.preferences.ZTXPreferencesSetValue("k", 1, name);
     EXPECT_FALSE(process.preferences.ZTXPreferencesSynchronize(name));
@@ -124,14 +123,14 @@ TEST(Preferences, ADomainThatCannotNameAFileIsRefused) {
   EXPECT_EQ(process.log.lines[1],
             "cannot set preference \"k\": \".hidden\" is not the name of a domain; use 1 to 200 "
             "characters, no slash or control character, and no dot in front");
-  EXPECT_TRUE(fs::is_empty(device.root.path("/")));
+  EXPECT_TRUE(fs::is_empty(root.path("/")));
   for (const std::size_t excess : {0U, 1U}) {
     const std::string name(limits::kPreferenceDomainBytes + excess, 'd');
     EXPECT_EQ(FilePreferences::isValidDomain(name), excess == 0);
   }
 }
 
-TEST(Preferences, AreOldOrNewAfterEveryFault) {
+TEST_F(PreferencesTest, AreOldOrNewAfterEveryFault) {
   const auto makeSteps = [](Process& process) {
     int done = 0;
     process.set("a", "new");
@@ -142,45 +141,36 @@ TEST(Preferences, AreOldOrNewAfterEveryFault) {
     return done;
   };
   for (const bool corrupt : {false, true}) {
+    SCOPED_TRACE(corrupt ? "corrupt before" : "");
     // What the file may hold after each step that reported success.
     const Lines states = corrupt ? Lines{"{}", R"({"a":"new"})", R"({"b":2})"}
                                  : Lines{R"({"a":"old","kept":1})", R"({"a":"new","kept":1})",
                                          R"({"b":2,"kept":1})"};
-    for (const auto fault : FaultyFileSystem::kFaults) {
-      int call = 1;
-      for (bool struck = true; struck; ++call) {
-        SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call
-                                        << (corrupt ? ", corrupt before" : ""));
-        const TemporaryRoot device;
-        if (corrupt) {
-          device.write(kFile, "garbage");
-        } else {
-          Process before(device.root);
-          before.set("a", "old");
-          before.set("kept", 1);
+    const auto prepare = [&](const TemporaryRoot& device) {
+      if (corrupt) return device.write(kFile, "garbage");
+      Process before(device.root);
+      before.set("a", "old");
+      before.set("kept", 1);
+    };
+    strikeEachCall(prepare, [&](const TemporaryRoot& device, FaultyFileSystem& faulty) {
+      {
+        Process process(device.root, faulty);
+        int done = makeSteps(process);
+        if (faulty.goesOn() && faulty.hasStruck()) {
+          EXPECT_TRUE(process.synchronize()) << "recovers by itself";
+          done = 2;
         }
-        FaultyFileSystem faulty(device.root.path("/"), fault, call);
-        {
-          Process process(device.root, faulty);
-          int done = makeSteps(process);
-          struck = faulty.hasStruck();
-          if (faulty.goesOn()) {
-            EXPECT_TRUE(process.synchronize()) << "recovers by itself";
-            done = 2;
-          }
-          faulty.settle();
-          Process after(device.root);
-          const std::string found = after.all();
-          EXPECT_NE(std::find(states.begin() + done, states.end(), found), states.end())
-              << found << " although step " << done << " was done";
-          EXPECT_TRUE(corrupt || after.log.lines.empty());
-        }
-        Process again(device.root);
-        EXPECT_EQ(makeSteps(again), 2);
-        EXPECT_EQ(Process(device.root).all(), states[2]);
-        ASSERT_LT(call, 200);
+        faulty.settle();
+        Process after(device.root);
+        const std::string found = after.all();
+        EXPECT_NE(std::find(states.begin() + done, states.end(), found), states.end())
+            << found << " although step " << done << " was done";
+        EXPECT_TRUE(corrupt || after.log.lines.empty());
       }
-    }
+      Process again(device.root);
+      EXPECT_EQ(makeSteps(again), 2);
+      EXPECT_EQ(Process(device.root).all(), states[2]);
+    });
   }
 }
 

@@ -524,8 +524,7 @@ TEST_F(RecordingFolderTest, IsOneRecordingThatPlaysTheSame) {
   EXPECT_EQ(log.lines, Lines{});
 }
 
-TEST(RecordedHubTest, AChannelMayBeAbsentFromAnUpdate) {
-  KeptLog log;
+TEST_F(RegistryTest, AChannelMayBeAbsentFromAnUpdate) {
   const Data absent{ByteSpan()};
   RecordedRegistry registry(
       hub({hubChannel(1, 1, Array{absent, group(1, 1, 1, 7), absent}),

@@ -1,4 +1,3 @@
-#include <map>
 #include <set>
 
 #include "platform/linux/store/kept_values.h"
@@ -17,28 +16,28 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   settle();
   const std::string whole = contentOf(store_->path());
   const std::string ofBad = " WHERE key = CAST('bad' || char(10) AS BLOB)";
+  const auto miscounts = [](int count) {
+    return format("it does not hold the %d values that it counts", count);
+  };
+  const std::string misformed = "its values are not in the form that this program writes";
+  const std::string misled = "it refers to values that cannot exist";
   // Whether a writer may append: it reads the row but not the chunks.
   const std::tuple<std::string, std::string, bool> cases[] = {
-      {"UPDATE chunks SET data = x'00' WHERE chunk = 0",
-       "its values are not in the form that this program writes", true},
-      {"DELETE FROM chunks WHERE chunk = 0", "it does not hold the 1 values that it counts", true},
-      {"UPDATE chunks SET data = zeroblob(16) WHERE chunk = 0",
-       "it does not hold the 1 values that it counts", true},
-      {"DELETE FROM chunks WHERE chunk = 1", "it does not hold the 1 values that it counts", true},
-      {"UPDATE chunks SET data = x'00' WHERE chunk = 1",
-       "its values are not in the form that this program writes", true},
-      {"UPDATE distributions SET count = 2" + ofBad, "it does not hold the 2 values that it counts",
-       false},
-      {"UPDATE distributions SET count = 0, runs = x''" + ofBad,
-       "it does not hold the 0 values that it counts", false},
-      {"UPDATE distributions SET count = -1" + ofBad,
-       "it does not hold the -1 values that it counts", false},
-      {"UPDATE distributions SET runs = x'000180'" + ofBad, "it refers to values that cannot exist",
-       false},
-      {"UPDATE distributions SET runs = x'FEFFFFFFFFFFFFFF7F0201'" + ofBad,
-       "it refers to values that cannot exist", false},
-      {"UPDATE chunks SET data = zeroblob(8 * 1025) WHERE chunk = 0",
-       "its values are not in the form that this program writes", true}};
+      {"UPDATE chunks SET data = x'00' WHERE chunk = 0", misformed, true},
+      {"DELETE FROM chunks WHERE chunk = 0", miscounts(1), true},
+      {"UPDATE chunks SET data = zeroblob(16) WHERE chunk = 0", miscounts(1), true},
+      {"DELETE FROM chunks WHERE chunk = 1", miscounts(1), true},
+      {"UPDATE chunks SET data = x'00' WHERE chunk = 1", misformed, true},
+      {"UPDATE distributions SET count = 2" + ofBad, miscounts(2), false},
+      {"UPDATE distributions SET count = 0, runs = x''" + ofBad, miscounts(0), false},
+      {"UPDATE distributions SET count = -1" + ofBad, miscounts(-1), false},
+      {"UPDATE distributions SET runs = x'000180'" + ofBad, misled, false},
+      {"UPDATE distributions SET runs = x'FEFFFFFFFFFFFFFF7F0201'" + ofBad, misled, false},
+      {"UPDATE chunks SET data = zeroblob(8 * 1025) WHERE chunk = 0", misformed, true}};
+  const auto lineAbout = [&](const std::string& reason) {
+    return where() + "distribution \"bad\\n\" of day 20784: " + reason +
+           ": restore the file from a copy or move it away";
+  };
   for (const auto& [change, reason, takesMore] : cases) {
     SCOPED_TRACE(change);
     settle();
@@ -58,14 +57,12 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
       return (*history)->walkDistributions("", kFirstDay, kLastDay, handler);
     };
     EXPECT_TRUE(walk("bad\n"));
-    const std::string line = where() + "distribution \"bad\\n\" of day 20784: " + reason +
-                             ": restore the file from a copy or move it away";
-    EXPECT_EQ(walk("").error().message, line);
+    EXPECT_EQ(walk("").error().message, lineAbout(reason));
     EXPECT_FALSE((*history)->distributionsForKeyPrefix(
         "", kToday - 1, kToday, [&](auto key, auto, auto& values, auto&) { see(key, values); }));
     const std::string bad = "bad\n0 failed";
     EXPECT_EQ(seen, (Lines{"good1", bad, "good1", bad, "good1"}));
-    EXPECT_EQ(log.lines, Lines{line});
+    EXPECT_EQ(log.lines, Lines{lineAbout(reason)});
     batch = store_->beginBatch();
     ASSERT_TRUE((*batch)->appendValue(kToday, "bad\n", 3, 3));
     EXPECT_EQ(static_cast<bool>((*batch)->commit()), takesMore);
@@ -74,20 +71,15 @@ TEST_F(StoreTest, ValuesThatCannotBeReadFailTheirKeyAlone) {
   settle();
   write(kStorePath, whole);
   sql("UPDATE distributions SET count = 2, runs = x'000202'" + ofBad);
+  const auto drop = [](auto, auto, auto, auto& values, auto&) { take(values); };
   EXPECT_EQ((*store_->openHistory())
-                ->walkDistribution("bad\n", kFirstDay, kLastDay,
-                                   [&](auto, auto, auto, auto& values, auto&) { take(values); })
+                ->walkDistribution("bad\n", kFirstDay, kLastDay, drop)
                 .error()
                 .message,
-            where() +
-                "distribution \"bad\\n\" of day 20784: it does not hold the 2 values that it "
-                "counts: restore the file from a copy or move it away");
+            lineAbout(miscounts(2)));
   sql("DELETE FROM chunks");
-  EXPECT_TRUE((*store_->openHistory())
-                  ->walkDistributions("", kFirstDay, kLastDay,
-                                      [&](auto, auto, auto, auto& values, auto&) { take(values); })
-                  .error()
-                  .message.ends_with("; 1 more could not be read whole"));
+  const auto none = (*store_->openHistory())->walkDistributions("", kFirstDay, kLastDay, drop);
+  EXPECT_TRUE(none.error().message.ends_with("; 1 more could not be read whole"));
   EXPECT_EQ(corruptions(), 0);
 }
 
@@ -290,44 +282,28 @@ TEST_F(StoreTest, ADamagedStoreLeavesDaysIncomplete) {
 class FailingReads {
  public:
   FailingReads(int at, bool andLater) {
-    system_ = sqlite3_vfs_find("unix");
-    vfs_ = *system_;
-    vfs_.zName = "failing";
-    vfs_.xOpen = open;
     at_ = at;
     andLater_ = andLater;
     reads_ = 0;
-    sqlite3_vfs_register(&vfs_, 1);
+    replaceReads(read);
   }
-  ~FailingReads() {
-    sqlite3_vfs_unregister(&vfs_);
-    sqlite3_vfs_register(system_, 1);
-  }
+  ~FailingReads() { replaceReads(nullptr); }
   static bool hasFailed() { return reads_ >= at_; }
 
  private:
-  static int open(sqlite3_vfs*, const char* name, sqlite3_file* file, int flags, int* outFlags) {
-    const int code = system_->xOpen(system_, name, file, flags, outFlags);
-    if (code != SQLITE_OK) return code;
-    read_ = file->pMethods->xRead;
-    sqlite3_io_methods& methods =
-        methods_.try_emplace(file->pMethods, *file->pMethods).first->second;
-    methods.xRead = read;
-    file->pMethods = &methods;
-    return code;
-  }
-  static int read(sqlite3_file* file, void* into, int size, sqlite3_int64 offset) {
+  static ssize_t read(int file, void* into, std::size_t size, off_t offset) {
     ++reads_;
     const bool fails = reads_ == at_ || (andLater_ && reads_ > at_);
-    // What SQLite turns EIO into. Statements turn it into SQLITE_CORRUPT.
-    return fails ? SQLITE_IOERR_CORRUPTFS : read_(file, into, size, offset);
+    errno = EIO;  // statements turn it into SQLITE_CORRUPT
+    return fails ? -1 : pread(file, into, size, offset);
+  }
+  // With null, those of the system.
+  static void replaceReads(decltype(&read) call) {
+    sqlite3_vfs* const system = sqlite3_vfs_find(nullptr);
+    for (const char* name : {"pread", "pread64"})
+      system->xSetSystemCall(system, name, reinterpret_cast<sqlite3_syscall_ptr>(call));
   }
 
-  static inline sqlite3_vfs* system_ = nullptr;
-  static inline sqlite3_vfs vfs_{};
-  // those of the database and of the log
-  static inline std::map<const sqlite3_io_methods*, sqlite3_io_methods> methods_;
-  static inline decltype(sqlite3_io_methods::xRead) read_ = nullptr;
   static inline int at_ = 0, reads_ = 0;
   static inline bool andLater_ = false;
 };

@@ -1,10 +1,10 @@
-#include <atomic>
 #include <csignal>
 #include <sys/resource.h>
 
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/store_path.h"
 #include "store_fixture.h"
+#include "tests/system/killed_process.h"
 
 namespace tavrel {
 namespace {
@@ -229,59 +229,20 @@ TEST_F(StoreTest, ReadersThatChangeNothingLeaveNoTraceAndSayWhenWritersInterfere
   EXPECT_EQ(rows, 4) << "what still stands in the log is read";
 }
 
-TEST_F(StoreTest, NothingIsLostAmongWritersThatAreKilled) {
-  // Each transaction adds one to a scalar and three values to a distribution, then reports success.
-  const auto writeForEver = [this](int acknowledgements) {
-    for (;;) {
-      auto batch = store_->beginBatch();
-      bool done = static_cast<bool>(batch);
-      for (int value = 0; value < 3; ++value)
-        done = done && (*batch)->appendValue(kToday, "d", 0, getpid());
-      if (!done || !(*batch)->addScalar(kToday, "n", 1) || !(*batch)->commit()) _exit(1);
-      if (::write(acknowledgements, ".", 1) != 1) _exit(2);
-    }
-  };
-  std::int64_t expected = 0;
-  for (int round = 0; round < 40; ++round) {
-    int ends[2];
-    ASSERT_EQ(pipe(ends), 0);
-    pid_t writers[2];
-    for (pid_t& writer : writers) {
-      writer = fork();
-      if (writer == 0) writeForEver(ends[1]);
-    }
-    close(ends[1]);
-    // Each round kills it at a different place of a transaction; the first rounds,
-    // while the store is being made.
-    int acknowledged = 0;
-    char byte;
-    while (acknowledged < round % 7 && read(ends[0], &byte, 1) == 1)
-      ++acknowledged;
-    for (std::atomic<int> spin = 0; spin < (round % 10) * 20'000;)
-      ++spin;
-    for (const pid_t writer : writers) {
-      kill(writer, SIGKILL);
-      int status = 0;
-      waitpid(writer, &status, 0);
-      EXPECT_TRUE(WIFSIGNALED(status)) << "a writer failed";
-    }
-    while (read(ends[0], &byte, 1) == 1)
-      ++acknowledged;
-    close(ends[0]);
-
-    std::int64_t kept = 0;
-    std::size_t values = 0;
-    for (const Row& row : scalarsOfToday())
-      kept = row.value;
-    store_->initWithDefaultPath()->distributionsForKeyPrefix(
-        "", kToday - 1, kToday, [&](auto, auto, auto& all, auto&) { values = take(all).size(); });
-    ASSERT_GE(kept, expected + acknowledged);
-    ASSERT_LE(kept, expected + acknowledged + 2);
-    ASSERT_EQ(values, static_cast<std::size_t>(kept) * 3);
-    expected = kept;
+TEST_F(StoreTest, AKillWhileItIsMadeLeavesAStoreOrNone) {
+  std::size_t calls = 0;
+  while (runUntilSystemCall(calls, [&] { set({{"k", kToday, 1}}); })) {
+    SCOPED_TRACE(++calls);
+    store_ = open();
+    const Rows kept = scalarsOfToday();
+    EXPECT_TRUE(kept.empty() || kept == (Rows{{"k", kToday, 1}}));
+    set({{"l", kToday, 2}});
+    EXPECT_EQ(scalarsOfToday().size(), kept.size() + 1);
+    EXPECT_EQ(corruptions(), 0);
+    std::filesystem::remove_all(std::filesystem::path(store_->path()).parent_path());
+    store_ = open();
   }
-  EXPECT_GT(expected, 100);
-  EXPECT_EQ(corruptions(), 0);
+  EXPECT_GT(calls, 50U);
 }
 
 }  // namespace

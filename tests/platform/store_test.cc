@@ -189,25 +189,24 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
   const std::string original = contentOf(store_->path());
   // Values and offsets as the letters that they are stored as, with the number of repetitions.
   const auto content = [this] {
-    Lines lines;
+    std::string text;
     const auto history = store_->openHistory();
     EXPECT_TRUE((*history)->walkScalars("", kToday, kToday, [&](auto key, auto, auto value, auto&) {
-      lines.push_back(std::string(key) + "=" + std::to_string(value));
+      text += format("%s=%lld ", key, value);
     }));
-    EXPECT_TRUE((*history)->walkDistributions(
-        "", kToday, kToday, [&](auto key, auto, auto count, auto& values, auto&) {
-          std::map<std::string, int> seen;
-          for (const Sample& sample : take(values)) {
-            std::string letters, offset;
-            appendPacked(letters, offset, {{sample}});
-            letters += offset;
-            ++seen[letters];
-          }
-          lines.push_back(std::string(key) + " " + std::to_string(count));
-          for (const auto& [letters, times] : seen)
-            lines.push_back(letters + " " + std::to_string(times));
-        }));
-    return lines;
+    EXPECT_TRUE((*history)->walkDistributions("", kToday, kToday,
+                                              [&](auto key, auto, auto count, auto& values, auto&) {
+                                                std::map<std::string, int> seen;
+                                                for (const Sample& sample : take(values)) {
+                                                  std::string letters, offset;
+                                                  appendPacked(letters, offset, {{sample}});
+                                                  ++seen[letters + offset];
+                                                }
+                                                text += format("%s %lld: ", key, count);
+                                                for (const auto& [letters, times] : seen)
+                                                  text += format("%d*%s ", times, letters);
+                                              }));
+    return text;
   };
   const auto write1 = [this] {
     auto batch = store_->beginBatch();
@@ -218,25 +217,10 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
     const Status done = (*batch)->commit();
     return done ? std::string("done") : done.error().message;
   };
-  const Lines before = {"a=5",
-                        "b=-6",
-                        "far 1024",
-                        "ABCDEFGHabcd 1024",
-                        "long 1026",
-                        "ABCDEFGHabcd 1024",
-                        "IJKLMNOPefgh 2",
-                        "short 1",
-                        "QRSTUVWXijkl 1"};
-  const Lines after = {"a=5",
-                       "b=7",
-                       "far 1024",
-                       "ABCDEFGHabcd 1024",
-                       "long 1026",
-                       "ABCDEFGHabcd 1024",
-                       "IJKLMNOPefgh 2",
-                       "short 2",
-                       "QRSTUVWXijkl 1",
-                       "YZ012345mnop 1"};
+  const std::string start =
+      "far 1024: 1024*ABCDEFGHabcd long 1026: 1024*ABCDEFGHabcd 2*IJKLMNOPefgh short ";
+  const std::string before = "a=5 b=-6 " + start + "1: 1*QRSTUVWXijkl ";
+  const std::string after = "a=5 b=7 " + start + "2: 1*QRSTUVWXijkl 1*YZ012345mnop ";
   EXPECT_EQ(content(), before);
   EXPECT_EQ(*(*store_->openHistory())->segmentPosition(0, SegmentName{}.identity), std::nullopt);
   store_->BHClientCheckpoint();
@@ -263,7 +247,7 @@ TEST_F(StoreTest, ReadsAndConvertsVersion1) {
                    : 2;
       };
       const int status = inChild(convert);
-      const Lines found = content();
+      const std::string found = content();
       EXPECT_TRUE(found == after || (found == before && status != 0));
       EXPECT_TRUE(status != 1 || sql("PRAGMA user_version") == Lines{"1"});
       if (found == after) ++converted;
@@ -286,32 +270,32 @@ TEST_F(StoreTest, PositionsOfSegmentsAreKeptWithTheValues) {
   const SegmentName segments[] = {named(0, 2), named(0, 0), named(0xFFFFFFFF, 2)};
   const std::string large(138'000, '\0');
   const std::string positions[] = {"first", "", large};
-  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(0, segments[0].identity), std::nullopt)
-      << "no store yet";
+  const auto positionIn = [&](const auto& reader, int i) {
+    return *(*reader)->segmentPosition(segments[i].owner, segments[i].identity);
+  };
+  EXPECT_EQ(positionIn(store_->openHistory(), 0), std::nullopt) << "no store yet";
   for (const bool isCommitted : {false, true}) {
     auto batch = store_->beginBatch();
     ASSERT_TRUE((*batch)->setScalar(kToday, "k", 1));
-    EXPECT_EQ(*(*batch)->segmentPosition(0, segments[0].identity), std::nullopt);
+    EXPECT_EQ(positionIn(batch, 0), std::nullopt);
     for (std::size_t i = 0; i < 3; ++i) {
-      ASSERT_TRUE((*batch)->setSegmentPosition(segments[i].owner, segments[i].identity, "early"));
-      ASSERT_TRUE(
-          (*batch)->setSegmentPosition(segments[i].owner, segments[i].identity, positions[i]));
+      for (const std::string& position : {std::string("early"), positions[i]})
+        ASSERT_TRUE(
+            (*batch)->setSegmentPosition(segments[i].owner, segments[i].identity, position));
     }
     ASSERT_TRUE(!isCommitted || (*batch)->commit());
   }
   const auto history = store_->openHistory();
   ASSERT_TRUE((*history)->beginSnapshot());
-  EXPECT_EQ(*(*history)->segmentPosition(0, segments[1].identity), "");
+  EXPECT_EQ(positionIn(history, 1), "");
   auto batch = store_->beginBatch();
   EXPECT_EQ(*(*batch)->segmentNames(), (std::vector{segments[1], segments[0], segments[2]}));
-  EXPECT_EQ(*(*batch)->segmentPosition(segments[2].owner, segments[2].identity), large);
+  EXPECT_EQ(positionIn(batch, 2), large);
   ASSERT_TRUE((*batch)->removeSegmentPosition(segments[2].owner, segments[2].identity));
   ASSERT_TRUE((*batch)->commit());
-  EXPECT_EQ(*(*history)->segmentPosition(segments[2].owner, segments[2].identity), large)
-      << "as at the beginning of the snapshot";
-  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(segments[2].owner, segments[2].identity),
-            std::nullopt);
-  EXPECT_EQ(*(*store_->openHistory())->segmentPosition(0, segments[0].identity), "first");
+  EXPECT_EQ(positionIn(history, 2), large) << "as at the beginning of the snapshot";
+  EXPECT_EQ(positionIn(store_->openHistory(), 2), std::nullopt);
+  EXPECT_EQ(positionIn(store_->openHistory(), 0), "first");
 }
 
 }  // namespace

@@ -20,16 +20,10 @@ const std::string kContent(10'000, 'L');
 constexpr std::int32_t kToday = 20784;  // the day of the fixed clock
 
 struct Service : ProcessServices {
-  Service(const DeviceRoot& root, FileSystem& fileSystem)
+  explicit Service(const DeviceRoot& root, FileSystem& fileSystem = quickFiles())
       : ProcessServices(root, fileSystem),
         version(root, fileSystem, coding, log),
         submission(root, services(fileSystem)) {
-    store.today = kToday;
-  }
-  explicit Service(const DeviceRoot& root)
-      : ProcessServices(root),
-        version(root, files, coding, log),
-        submission(root, services(files)) {
     store.today = kToday;
   }
 
@@ -78,13 +72,14 @@ std::ptrdiff_t filesPending(const TemporaryRoot& device) {
   return std::distance(fs::directory_iterator(folder, missing), {});
 }
 
-TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
-  const TemporaryRoot device;
-  permit(device, true, kToday - 1);
-  device.write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
+struct Submission : testing::Test, TemporaryRoot {};
+
+TEST_F(Submission, FilesALogWithItsMetadataAndSendsItOn) {
+  permit(*this, true, kToday - 1);
+  write("/etc/os-release", "NAME=\"Example OS\"\nVERSION_ID=4.2\nBUILD_ID=8N5\n");
   const std::string orphan = "/var/mobile/Library/Logs/Submission/pending/old.metadata.plist";
-  device.write(orphan, "left by a process that was killed");
-  Service service(device.root);
+  write(orphan, "left by a process that was killed");
+  Service service(root);
   ASSERT_TRUE(service.file("log-tallied", {{"previous_os_version", "<unknown>"}}));
   service.clock.time = plist::Date::since1970(1'795'802'600);
   ASSERT_TRUE(service.file("../Storage Status"));
@@ -107,56 +102,47 @@ TEST(Submission, FilesALogWithItsMetadataAndSendsItOn) {
       R"j("Options":{"previous_os_version":"<unknown>"},"Time":"2026-11-27T18:02:18.000Z"})j");
   for (int time = 0; time < 2; ++time)
     service.submission.submitDiagnosticLogs();
-  EXPECT_EQ(filesPending(device), 0);
+  EXPECT_EQ(filesPending(*this), 0);
   EXPECT_EQ(service.submission.logs(Place::Outbox)->size(), 2U);
   EXPECT_TRUE(service.log.lines.empty());
 }
 
-TEST(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
-  for (const auto fault : FaultyFileSystem::kFaults) {
-    int call = 1;
-    for (bool struck = true; struck; ++call) {
-      SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
-      const TemporaryRoot device;
-      permit(device, true);
-      FaultyFileSystem faulty(device.root.path("/"), fault, call);
-      Service service(device.root, faulty);
-      const bool filed = service.file();
-      if (!filed) {
-        ASSERT_FALSE(service.log.lines.empty());
-        EXPECT_EQ(service.log.lines.back().find("cannot file log \"log-tallied\": "), 0U);
-        EXPECT_TRUE(!faulty.goesOn() || filesPending(device) == 0) << "nothing of it is left";
-      }
-      service.submission.submitDiagnosticLogs();
-      struck = faulty.hasStruck();
-      faulty.settle();
-
-      Service after(device.root);
-      std::set<std::string> names;
-      for (const Place place : {Place::Pending, Place::Outbox}) {
-        const auto logs = *after.submission.logs(place);
-        for (const auto& log : logs) {
-          EXPECT_EQ(contentOf(log.path), kContent);
-          EXPECT_EQ(log.metadata.string("LogType"), "193");
-          names.insert(log.name);
-        }
-      }
-      EXPECT_TRUE(names.size() == 1 || (!filed && names.empty())) << "what was filed stays";
-
-      EXPECT_TRUE(after.file());
-      after.submission.submitDiagnosticLogs();
-      EXPECT_EQ(after.submission.logs(Place::Pending)->size(), 0U);
-      EXPECT_EQ(after.submission.logs(Place::Outbox)->size(), names.size() + 1);
-      ASSERT_LT(call, 200);
+TEST_F(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
+  const auto prepare = [](const TemporaryRoot& device) { permit(device, true); };
+  strikeEachCall(prepare, [](const TemporaryRoot& device, FaultyFileSystem& faulty) {
+    Service service(device.root, faulty);
+    const bool filed = service.file();
+    if (!filed) {
+      ASSERT_FALSE(service.log.lines.empty());
+      EXPECT_EQ(service.log.lines.back().find("cannot file log \"log-tallied\": "), 0U);
+      EXPECT_TRUE(!faulty.goesOn() || filesPending(device) == 0) << "nothing of it is left";
     }
-  }
+    service.submission.submitDiagnosticLogs();
+    faulty.settle();
+
+    Service after(device.root);
+    std::set<std::string> names;
+    for (const Place place : {Place::Pending, Place::Outbox}) {
+      const auto logs = *after.submission.logs(place);
+      for (const auto& log : logs) {
+        EXPECT_EQ(contentOf(log.path), kContent);
+        EXPECT_EQ(log.metadata.string("LogType"), "193");
+        names.insert(log.name);
+      }
+    }
+    EXPECT_TRUE(names.size() == 1 || (!filed && names.empty())) << "what was filed stays";
+
+    EXPECT_TRUE(after.file());
+    after.submission.submitDiagnosticLogs();
+    EXPECT_EQ(after.submission.logs(Place::Pending)->size(), 0U);
+    EXPECT_EQ(after.submission.logs(Place::Outbox)->size(), names.size() + 1);
+  });
 }
 
-TEST(Submission, NoTaskingChangesThePermission) {
-  const TemporaryRoot device;
+TEST_F(Submission, NoTaskingChangesThePermission) {
   for (const bool isGiven : {true, false}) {
-    permit(device, isGiven, kToday);
-    LinuxPlatform run(device.root);
+    permit(*this, isGiven, kToday);
+    LinuxPlatform run(root);
     Preferences& guarded = run.platform().preferences;
     for (const char* const key : {"DiagnosticSubmissionEnabled", "DiagnosticSubmissionFirstDay"}) {
       for (const plist::Value& value : {plist::Value(!isGiven), plist::Value(0), plist::Value()})
@@ -170,7 +156,7 @@ TEST(Submission, NoTaskingChangesThePermission) {
   }
 }
 
-TEST(Submission, FilesWhatTheOwnerPermits) {
+TEST_F(Submission, FilesWhatTheOwnerPermits) {
   constexpr std::int32_t kNoRows = -1;
   const struct {
     bool isGiven;
@@ -218,9 +204,8 @@ TEST(Submission, FilesWhatTheOwnerPermits) {
   }
 }
 
-TEST(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
-  const TemporaryRoot device;
-  Service service(device.root);
+TEST_F(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
+  Service service(root);
   for (int i = 0; i < 10; ++i) {
     // At first the clock is ahead, in the end it is lost.
     service.clock.time = plist::Date::since1970(i == 0  ? 2'114'380'800
@@ -232,46 +217,45 @@ TEST(Submission, WithholdsTheNewestLogsForTheOwnerAlone) {
   ASSERT_EQ(logs.size(), 8U);
   EXPECT_EQ(logs[0].name.substr(0, 18), "S-19700101T000005Z");
   EXPECT_EQ(logs[1].name.substr(0, 18), "S-20261127T180220Z");
-  const std::string folder = device.root.path(kFolder + "withheld");
+  const std::string folder = root.path(kFolder + "withheld");
   EXPECT_EQ(fs::status(folder).permissions(), fs::perms::owner_all);
   for (const auto& entry : fs::directory_iterator(folder))
     EXPECT_EQ(entry.status().permissions(), fs::perms::owner_read | fs::perms::owner_write);
   EXPECT_EQ(std::distance(fs::directory_iterator(folder), {}), 16);
 }
 
-TEST(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
-  const TemporaryRoot device;
+TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
   for (const char* file :
        {"pending/a.log", "pending/a.metadata.plist", "pending/left.metadata.plist",
         "pending/.tavrel-half.tmp", "outbox/a.log", "outbox/b.log", "outbox/b.metadata.plist"}) {
-    device.write(kFolder + file, "x");
+    write(kFolder + file, "x");
   }
-  device.write(kFolder + "pending/folder.log/foreign", "x");
-  device.write(kFolder + "pending/foreign.txt", "x");
-  fs::create_symlink(device.root.path(kFolder + "pending/foreign.txt"),
-                     device.root.path(kFolder + "pending/link.log"));
+  write(kFolder + "pending/folder.log/foreign", "x");
+  write(kFolder + "pending/foreign.txt", "x");
+  fs::create_symlink(root.path(kFolder + "pending/foreign.txt"),
+                     root.path(kFolder + "pending/link.log"));
   const auto files = [&] {
     std::set<std::string> names;
-    for (const auto& entry : fs::recursive_directory_iterator(device.root.path(kFolder)))
+    for (const auto& entry : fs::recursive_directory_iterator(root.path(kFolder)))
       if (!entry.is_directory() && entry.path().filename() != ".lock")
         names.insert(entry.path().filename());
     return names;
   };
   const auto before = files();
   const auto ask = [&] {
-    Service service(device.root);
+    Service service(root);
     EXPECT_FALSE(service.submission.isDiagnosticSubmissionEnabled());
     service.submission.submitDiagnosticLogs();
     return service.log.lines;
   };
-  device.write(kPermission, "damaged");
+  write(kPermission, "damaged");
   ask();
-  permit(device, true, kToday + 1);
+  permit(*this, true, kToday + 1);
   ask();
   EXPECT_EQ(files(), before);
 
   // Preferences that become unreadable after the first look may hold a permission, too.
-  permit(device, false);
+  permit(*this, false);
   struct Damaging : FileSystem {
     explicit Damaging(const TemporaryRoot& device) : root(device) {}
     int openFile(const char* path, int flags, mode_t mode) override {
@@ -279,34 +263,31 @@ TEST(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
       return FileSystem::openFile(path, flags, mode);
     }
     const TemporaryRoot& root;
-  } damaging(device);
-  EXPECT_FALSE(Service(device.root, damaging).submission.isDiagnosticSubmissionEnabled());
-  EXPECT_EQ(contentOf(device.root.path(kPermission)), "damaged");
+  } damaging(*this);
+  EXPECT_FALSE(Service(root, damaging).submission.isDiagnosticSubmissionEnabled());
+  EXPECT_EQ(contentOf(root.path(kPermission)), "damaged");
   EXPECT_EQ(files(), before);
 
-  permit(device, false, kToday + 1);
+  permit(*this, false, kToday + 1);
   EXPECT_EQ(ask(),
             (std::vector<std::string>{"submission is not allowed: 3 waiting logs deleted",
                                       "no log is moved to the outbox: submission is not allowed"}));
   EXPECT_EQ(files(), (std::set<std::string>{"foreign", "foreign.txt"}));
-  EXPECT_EQ(contentOf(device.root.path(kPermission)).find("FirstDay"), std::string::npos);
+  EXPECT_EQ(contentOf(root.path(kPermission)).find("FirstDay"), std::string::npos);
 }
 
-TEST(Submission, FilesNothingWhenThePermissionGoesMeanwhile) {
-  const TemporaryRoot device;
-  permit(device, true);
-  Service service(device.root);
-  service.readRowsOf(kToday - 1);
-  EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission(
-      "193", "log-tallied", {}, [&](LogFile&) { permit(device, false); }));
-  EXPECT_EQ(service.log.lines.back(),
-            "cannot file log \"log-tallied\": submission is no longer allowed");
-  permit(device, true);
-  service.readRowsOf(kToday - 1);
-  EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission("193", "log-tallied", {}, [&](LogFile&) {
-    permit(device, true, kToday + 1);
-  })) << "withdrawn and given again";
-  EXPECT_EQ(filesPending(device), 0);
+TEST_F(Submission, FilesNothingWhenThePermissionGoesMeanwhile) {
+  Service service(root);
+  // Withdrawn, and given again for later days.
+  for (const auto& [isGiven, firstDay] : {std::pair(false, plist::Value()), {true, kToday + 1}}) {
+    permit(*this, true);
+    service.readRowsOf(kToday - 1);
+    EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission(
+        "193", "log-tallied", {}, [&](LogFile&) { permit(*this, isGiven, firstDay); }));
+    EXPECT_EQ(service.log.lines.back(),
+              "cannot file log \"log-tallied\": submission is no longer allowed");
+  }
+  EXPECT_EQ(filesPending(*this), 0);
 }
 
 }  // namespace
