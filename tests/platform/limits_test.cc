@@ -273,7 +273,8 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   write(std::string(kPending) + "other.txt", std::string(99'999, 'x'));
   const std::string records = "/var/mobile/Library/Logs/CrashReporter/StructuredData/";
   write(records + "176-2026-11-27.jsonl", std::string(90'000, 'r'));
-  write(records + "176-2026-11-26.jsonl", "r");
+  write(records + "176-2026-11-26.jsonl", std::string(70'000, 'r'));
+  write(records + "176-2026-11-25.jsonl", "r");
   write("/var/lib/tavrel/ecc-events/b.event", std::string(60'000, 'e'));
   write("/var/lib/tavrel/ecc-events/a.event", std::string(60'000, 'e'));
   write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb-kept-damaged", std::string(70'000, 'c'));
@@ -295,19 +296,23 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
                    "log-tallied-20261126T000000Z-00000002.metadata.plist",
                    "log-tallied-20261127T000000Z-00000001.log",
                    "log-tallied-20261127T000000Z-00000001.metadata.plist", "other.txt"}));
-  EXPECT_EQ(*files.list(root.path(records)), Lines{"176-2026-11-27.jsonl"});
+  EXPECT_EQ(*files.list(root.path(records)),
+            (Lines{"176-2026-11-25.jsonl", "176-2026-11-27.jsonl"}));
   EXPECT_EQ(*files.list(root.path("/var/lib/tavrel/ecc-events")), Lines{"b.event"});
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.pending.logs"), 2);
   EXPECT_EQ(statistic("com.norvane.tavrel.limits.records.files"), 1);
 
-  // The newest log stays, however small the limit; the limit of days works like that of bytes.
+  // The newest log stays, however small the limit, and others do not go instead of one that exceeds
+  // it alone; the limit of days works like that of bytes.
   fileLog("log-tallied-20261127T000009Z-00000005", 400'000);
+  fileLog("log-tallied-20261127T000001Z-00000007", 70'000);
   fileLog("StorageStatus-20261126T000009Z-00000006", 1);
   limit({{"Pending", Dictionary{{"Days", 1}}}});
   EXPECT_EQ(tidy().kinds[1].removed, 2);
   limit({{"Pending", small}});
   EXPECT_EQ(tidy().kinds[1].removed, 1);
-  EXPECT_EQ(files.list(root.path(kPending))->size(), 3U);
+  EXPECT_FALSE(fs::exists(root.path(kPending) + "log-tallied-20261127T000001Z-00000007.log"));
+  EXPECT_EQ(files.list(root.path(kPending))->size(), 5U);
 }
 
 TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {

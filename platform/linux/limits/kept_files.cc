@@ -1,8 +1,9 @@
 #include "platform/linux/limits/kept_files.h"
 
 #include <algorithm>
+#include <map>
+#include <ranges>
 #include <set>
-#include <utility>
 
 #include "base/civil_time.h"
 #include "platform/linux/device/ecc_events.h"
@@ -148,15 +149,15 @@ KeptUse KeptFiles::use() const {
   return use;
 }
 
-bool KeptFiles::stays(std::size_t index) const {
+std::vector<KeptFile>::iterator KeptFiles::beginOfStaying() {
   switch (kind_) {
     case Kept::EccEvents:
     case Kept::SetAside:
-      return false;
+      return list_.end();
     case Kept::Records:
-      return list_[index].day() == today_;
+      return std::ranges::find(list_, today_, &KeptFile::day);
     default:
-      return index + 1 == list_.size();
+      return list_.empty() ? list_.end() : list_.end() - 1;
   }
 }
 
@@ -165,27 +166,35 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds) {
     fileSystem_.discard(path);
   TrimmedFiles trimmed;
   KeptUse left = use();
+  const auto staying = beginOfStaying();
+  // While a file that alone exceeds the bound is there, removing others does not help: it goes
+  // before them or, when it stays, does not count.
+  std::int64_t stayingBytes = 0;
+  for (const KeptFile& file : std::ranges::subrange(staying, list_.end()))
+    stayingBytes += file.bytes;
+  if (stayingBytes > bounds.bytes) left.bytes -= stayingBytes;
+  std::ranges::stable_partition(list_.begin(), staying, [&bounds](const KeptFile& file) {
+    return file.bytes > bounds.bytes;
+  });
+  std::map<std::int64_t, std::size_t> filesOfDays;
+  for (const KeptFile& file : list_)
+    ++filesOfDays[file.day()];
   std::vector<std::string> companions;
-  bool dayStays = false;
   std::int64_t stuckBytes = 0;
-  for (std::size_t i = 0; i < list_.size() && !stays(i); ++i) {
+  for (const KeptFile& file : std::ranges::subrange(list_.begin(), staying)) {
     if (left.days <= bounds.days && left.bytes <= bounds.bytes) break;
-    const KeptFile& file = list_[i];
     // A log that the uploader has sent meanwhile is not lost.
     const bool isThere = FileSystem::status(file.path).has_value();
     if (Status removed = fileSystem_.remove(file.path); removed) {
       trimmed.removed += isThere ? 1 : 0;
       left.bytes -= file.bytes;
+      if (--filesOfDays[file.day()] == 0) --left.days;
       if (!file.companion.empty()) companions.push_back(file.companion);
     } else {
       if (trimmed.status) trimmed.status = removed;
       // Removing all others would not bring them within the bound.
       if (stuckBytes += file.bytes; stuckBytes > bounds.bytes) break;
-      dayStays = true;
     }
-    // Files of one day are adjacent, so a day has gone once the next file is of another day.
-    const bool isLastOfDay = i + 1 == list_.size() || list_[i + 1].day() != file.day();
-    if (isLastOfDay && !std::exchange(dayStays, false)) --left.days;
   }
   if (Status removed = removeCompanions(companions); trimmed.status) trimmed.status = removed;
   return trimmed;

@@ -51,9 +51,10 @@ class KeptFiles {
 
   KeptUse use() const;
 
-  /// Removes what exceeds the bounds. In place of a file that cannot be removed, the next ones go.
-  /// The newest log, and the records of `today`, always stay. Also
-  /// removes metadata that a killed process left without its log.
+  /// Removes what exceeds the bounds, first the files that do so alone. In place of a file that
+  /// cannot be removed, the next ones go. The newest log, and the records of `today`, always stay,
+  /// and do not count when they alone exceed the bound. Also removes metadata that a killed process
+  /// left without its log.
   TrimmedFiles trim(const Bounds& bounds);
 
  private:
@@ -65,7 +66,8 @@ class KeptFiles {
   Status listEvents();
   Status listSetAside(const std::string& folder);
   void add(const std::string& path, std::int64_t seconds);
-  bool stays(std::size_t index) const;
+  /// The files from here on always stay.
+  std::vector<KeptFile>::iterator beginOfStaying();
   Status removeCompanions(const std::vector<std::string>& companions);
 
   Kept kind_;
