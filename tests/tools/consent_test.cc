@@ -253,6 +253,10 @@ TEST_F(Consent, ErasesDaysOrAll) {
   fileLogs({"pending/a", "outbox/a", "withheld/b", "refused/c"});
   for (const char* damaged : {".corrupt-X", "-kept-damaged"})
     device.write(kStore + damaged, "x");
+  const std::string halfWritten = "/var/mobile/Library/Brimhold/.tavrel-1.tmp";
+  const std::string metrics = "/run/tavrel/metrics/tavrel.prom";
+  for (const std::string& path : {halfWritten, metrics})
+    device.write(path, "x");
   device.check("erase --key a", fails("not a terminal: add --yes to erase without asking", 2));
   for (const std::string answer : {"y\n", "yes\n"}) {
     std::istringstream in(answer);
@@ -276,13 +280,16 @@ TEST_F(Consent, ErasesDaysOrAll) {
                {0, "erased: 1 scalar, 1 distribution of 1 value, 1 file of records\n",
                 "tavrelctl: 2 waiting logs may report what was erased: 'tavrelctl deny' deletes "
                 "what waits, and withdraws the permission\n"});
+  EXPECT_FALSE(fs::exists(device.path(halfWritten)));
+  EXPECT_TRUE(fs::exists(device.path(metrics)));
   EXPECT_TRUE(fs::exists(device.path(records + "4.jsonl")));
   EXPECT_TRUE(fs::exists(device.path(records + "6.jsonl")));
   device.check("erase --yes --all", prints("erased: 1 scalar, 0 distributions of 0 values, 2 files "
                                            "of records, 3 logs, 2 damaged files\n"));
   for (const auto& [path, content] : device.files())
     EXPECT_TRUE(path.find(".log") == std::string::npos && path.find("-kept") == std::string::npos &&
-                path.find("corrupt") == std::string::npos)
+                path.find("corrupt") == std::string::npos &&
+                path.find(".prom") == std::string::npos)
         << path;
   device.check("stat list", prints("no statistics\n"));
   device.check("erase --yes --all", prints("nothing to erase\n"));

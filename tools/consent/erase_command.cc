@@ -144,24 +144,38 @@ bool isSetAside(const std::string& name, const std::string& store) {
   return name.starts_with(store + ".corrupt-") || name == store + "-kept-damaged";
 }
 
+/// What a killed process left of a new version of the values kept beside the store.
+Status discardHalfWritten(FileSystem& files, const std::string& folder) {
+  if (!FileSystem::status(folder)) return Done{};
+  const auto lock = files.lockFolder(folder);
+  if (!lock) return lock.error();
+  files.discardTemporaries(folder);
+  return files.flushFolder(folder);
+}
+
 /// Erases in steps. A failure ends it, and the next call does the rest; only values that cannot be
 /// folded do not stop the other steps. Logs go last: a run that begins after the rows are gone
 /// makes no new ones from them.
 Status erase(ToolContext& context, const Scope& scope, Erased& erased) {
   LinuxPlatform& device = context.linuxPlatform();
   const Status folded = foldEverything(context);
+  FileSystem& files = device.fileSystem();
   const auto rows = device.store().erase(scope.rows);
   if (!rows) return rows.error();
   erased.rows = *rows;
+  const std::string& store = device.store().path();
+  const std::size_t slash = store.rfind('/');
+  const std::string folder = store.substr(0, slash);
+  if (Status discarded = discardHalfWritten(files, folder); !discarded) return discarded;
   if (scope.logs) {
-    const std::string& store = device.store().path();
-    const std::size_t slash = store.rfind('/');
     const std::string name = store.substr(slash + 1);
-    const auto aside =
-        removeFiles(device.fileSystem(), store.substr(0, slash),
-                    [&name](const std::string& file) { return isSetAside(file, name); });
+    const auto aside = removeFiles(
+        files, folder, [&name](const std::string& file) { return isSetAside(file, name); });
     if (!aside) return aside.error();
     erased.asideFiles = *aside;
+    const std::string metrics = context.root().path("/run/tavrel/metrics");
+    files.discardTemporaries(metrics);
+    if (Status removed = files.remove(metrics + "/tavrel.prom"); !removed) return removed;
   }
   if (scope.records) {
     const auto records = removeRecords(context, scope.rows);
