@@ -8,9 +8,11 @@
 
 #include "base/format.h"
 #include "platform/linux/folding/recorded_history.h"
+#include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
+#include "platform/linux/segments/segment_reader.h"
 #include "platform/linux/store/kept_values.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
@@ -31,6 +33,10 @@ struct AllowArguments {
 
 /// The latest day for which anything is recorded, anywhere; nothing when nothing is.
 Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
+  // Gives values without a date the day that the clock shows now. A later fold could give them a
+  // later day, when the clock is behind now.
+  const FoldReport folded = context.linuxPlatform().fold().run();
+  if (folded.failure) return Error{*folded.failure};
   Platform& platform = context.platform();
   const Recorders recorders = Recorders::read(context.root(), context.linuxPlatform().fileSystem(),
                                               platform.propertyLists, platform.log);
@@ -58,6 +64,14 @@ Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
 /// The first day of a permission that is given now: a day for which nothing has been recorded yet,
 /// even if the clock was or is wrong.
 Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today) {
+  // What is recorded now gets its date only when the clock is set, and would be after any first
+  // day.
+  if (!currentBootInstant()) {
+    return Error{
+        format("today is day %s, before this program was built: set the clock first, or "
+               "give --from DAY",
+               dayText(today))};
+  }
   const auto latest = latestRecordedDay(context);
   if (!latest) {
     return Error{format("%s; 'tavrelctl allow --from DAY' does not look at what is recorded",

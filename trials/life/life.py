@@ -71,11 +71,11 @@ class Life:
         self.update_system()
         self.update_whitelist()
         self.device.write("etc/tavrel/languages", LANGUAGES)
+        self.agree_before_the_clock_is_right()
         self.recorder = Recorder(self.device, "recorder", self.recorder_program)
         self.statsd = Statsd(self.device)
         self.sampler = Sampler(self.device)
         self.model.record(self.clock, self.build_day, "a", "com.norvane.usage.samples", 1)
-        self.allow()
 
     # -- What programs do ---------------------------------------------------------------------
 
@@ -122,11 +122,16 @@ class Life:
         recorder = Recorder(self.device, "killed", self.recorder_program)
         self.record(recorder, {"a": [f"com.example.v{self.updates}.starts"], "s": ["com.example.k"],
                                "r": [f"com.example.v{self.updates}.seconds"]}, 20)
+        self.device.kills["recorder"] += self.kill_recorder(recorder)
+
+    def kill_recorder(self, recorder):
+        """Returns whether it was still running."""
         self.device.residents.pop("killed")
         recorder.process.kill()
-        self.device.kills["recorder"] += recorder.process.wait() == -9
+        status = recorder.process.wait()
         recorder.process.stdin.close()
         recorder.process.stdout.close()
+        return status == -9
 
     def fold(self):
         self.device.tool("stat", "fold")

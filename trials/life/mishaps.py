@@ -3,7 +3,7 @@ happen; their names appear in the summary."""
 
 import os
 
-from device import PREFERENCES, SECONDS_PER_DAY, STORE, SUBMISSION, WHITELIST
+from device import PREFERENCES, Recorder, SECONDS_PER_DAY, STORE, SUBMISSION, WHITELIST
 from life import Life, expect
 from model import DA, LAST_RUN, LOCALES, OTHER, OWN, date_text
 
@@ -32,6 +32,26 @@ class Mishaps(Life):
         expect(done.out == f"submission is allowed from day {day} ({date_text(day)}) on\n",
                done.out)
         self.model.permitted, self.model.first_day = True, day
+        if not arguments:
+            self.model.fold(self.clock, self.build_day)
+
+    def agree_before_the_clock_is_right(self):
+        """What is recorded in 1970 never leaves, even if the clock is still behind when it is set."""
+        self.clock.set_wrong(-(self.clock.true // SECONDS_PER_DAY) * SECONDS_PER_DAY)
+        # A program that is killed: memory must not keep what another clock would date differently.
+        recorder = Recorder(self.device, "killed", self.recorder_program)
+        for kind, key, value in (("a", "com.example.s0", 7), ("s", "com.example.level", 5),
+                                 ("r", "com.example.d0", 2.5)):
+            recorder.tell([f"{kind} {key} {value}"])
+            self.model.record(self.clock, self.build_day, kind, key, value)
+        self.kill_recorder(recorder)
+        done = self.device.run("tavrelctl", "allow")
+        expect((done.status, done.err) == (
+            1, "tavrelctl: today is day 0 (1970-01-01), before this program was built: set the "
+            "clock first, or give --from DAY\n"), f"{done.status} {done.err}")
+        self.clock.set_wrong(-5 * SECONDS_PER_DAY)
+        self.allow()
+        self.clock.set_wrong(0)
 
     def deny(self):
         if self.chance.random() < 0.5:
