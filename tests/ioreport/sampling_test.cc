@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 #include <memory_resource>
-#include <random>
+#include <sstream>
 
 #include "reporting.h"
 
@@ -99,50 +99,34 @@ TEST(SubscriptionTest, FailsAtEachStepWithItsOwnWords) {
     EXPECT_FALSE(createInterestList(kWanted, count)) << count;
 }
 
-// The rule of extraction in its plainest form: the index of the element where the channel's group
-// begins, -1 for none, -2 when an empty group ends the sampling.
-int plainGroup(ByteSpan buffer, std::uint64_t channelID) {
-  const std::size_t elements = buffer.size() / 64;
-  for (std::size_t i = 0; i < elements;) {
-    const std::size_t count = *loadLittle16(buffer, i * 64 + 20);
-    if (count == 0) return -2;
-    if (*loadLittle64(buffer, i * 64) == 7 && *loadLittle64(buffer, i * 64 + 8) == channelID)
-      return i + count <= elements ? static_cast<int>(i) : -1;
-    i += count;
-  }
-  return -1;
-}
-
-TEST(SamplesTest, ExtractsAsThePlainRuleDoes) {
-  std::mt19937 random(1);
-  for (int round = 0; round < 3000; ++round) {
+TEST(SamplesTest, TakesTheFirstWholeGroupOfEachChannel) {
+  // Elements as CHANNEL and COUNT, in lower case if they are another driver's; then the channels
+  // that were found, each with the index of its first element and the number of its elements.
+  const std::pair<std::string, std::string> kCases[] = {
+      {"A1 B1 C1", "A0+1 B1+1 C2+1 "}, {"A2 B1 C1", "A0+2 C2+1 "},
+      {"B3 A1 C1", "B0+3 "},           {"B4 A1 C1", ""},
+      {"A1 C65535 B1", "A0+1 "},       {"C1 B2 A1 A1", "A3+1 B1+2 C0+1 "},
+      {"A1 A2 A1", "A0+1 "},           {"a1 A1 c2 C1", "A1+1 "},
+      {"X1 Y2 A1 B2 A1", "B3+2 "}};
+  for (const auto& [elements, expected] : kCases) {
     std::vector<std::byte> buffer;
-    const std::size_t elements = 1 + random() % 8;
-    for (std::size_t i = 0; i < elements; ++i) {
-      const std::uint64_t count = random() % 8 == 0 ? random() % 2 * 65535 : 1 + random() % 3;
-      const std::uint64_t driver = random() % 9 == 0 ? 8 : 7;
-      append(buffer, {driver, 'A' + random() % 4, typeOf(1, count), 0, i, 0, 0, 0});
+    std::istringstream words(elements);
+    char channel = 0;
+    std::uint64_t count = 0;
+    for (std::uint64_t position = 0; words >> channel >> count; ++position) {
+      const std::uint64_t driver = channel > 'Z' ? 8 : 7;
+      const auto id = static_cast<std::uint64_t>(std::toupper(channel));
+      append(buffer, {driver, id, typeOf(1, count), 0, position, 0, 0, 0});
     }
-    buffer.resize(buffer.size() + random() % 64);
-    Array channels = Array::create();
-    std::string expected;
-    bool stops = false;
-    for (std::uint64_t id = 'A'; id < 'F' && !stops; ++id) {
-      channels.append(channelOf(7, static_cast<std::int64_t>(id), typeOf(1, 1)));
-      const int at = plainGroup(buffer, id);
-      stops = at == -2;
-      if (at >= 0) expected += format("%llu:%d ", id, at);
-    }
-    const auto samples = IOReportCreateSamplesRaw(aggregateOf(channels), buffer, nullptr);
-    ASSERT_EQ(static_cast<bool>(samples), !stops);
+    buffer.resize(buffer.size() + 63);
+    const Dictionary samples = IOReportCreateSamplesRaw(kWanted, buffer, nullptr);
     std::string found;
-    for (const Value& channel : samples.array("IOReportChannels")) {
-      const Elements raw = getRawElements(channel.dictionary(), 1);
-      const std::int64_t at = raw.value(0, 0);
-      EXPECT_EQ(raw.count(), *loadLittle16(buffer, static_cast<std::uint64_t>(at) * 64 + 20));
-      found += format("%llu:%lld ", raw.channelID(0), at);
+    for (const Value& sample : samples.array("IOReportChannels")) {
+      const Elements raw = getRawElements(sample.dictionary(), 1);
+      found +=
+          format("%c%lld+%zu ", static_cast<char>(raw.channelID(0)), raw.value(0, 0), raw.count());
     }
-    ASSERT_EQ(found, stops ? "" : expected);
+    EXPECT_EQ(found, expected) << elements;
   }
 }
 
