@@ -28,15 +28,12 @@ const std::string kFree = "scalar com.norvane.lumenhall.DiskUsageUserBlocksFree"
 const fakes::Journal kTasks{"checkpoint", kTotal, kFree, "clean structured logs",
                             "roll support log"};
 const std::string kOwn = "set com.norvane.tallied.tavrel ";
-const fakes::Journal kGatedTasks{"checkpoint",
-                                 kTotal,
-                                 kFree,
-                                 "clean structured logs",
-                                 "roll support log",
-                                 "checkpoint",
-                                 kOwn + "LastLogOutcome",
-                                 kOwn + kDayKey,
-                                 "synchronize com.norvane.tallied.tavrel"};
+const fakes::Journal kGatedTasks = [] {
+  fakes::Journal journal = kTasks;
+  journal.insert(journal.end(), {"checkpoint", kOwn + "LastLogOutcome", kOwn + kDayKey,
+                                 "synchronize com.norvane.tallied.tavrel"});
+  return journal;
+}();
 
 struct DailyRunTest : ::testing::Test {
   fakes::FakePlatform fake;
@@ -133,18 +130,24 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
   EXPECT_EQ(run(2), "no log for day 2: no value found for any whitelisted key");
   run(3);
   EXPECT_EQ(std::ranges::count(fake.journal, kOwn + "LastLogOutcome"), 0);
-  fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}, {"k", 6, 1}};
+  fake.store.scalars = {{"k", 4, 1}, {"k", 5, 1}, {"k", 6, 1}, {"k", 7, 1}};
   EXPECT_EQ(run(4), "writing tallied log. yesterday=4");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("filed"));
+  const std::string inPart = " without statistics that could not be read; see the system log";
   fake.store.distributionsAreReadable = false;
-  EXPECT_EQ(run(5),
-            "a log for day 5 without statistics that could not be read; see the system log");
+  EXPECT_EQ(run(5), "a log for day 5" + inPart);
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("filed-in-part"));
   fake.submission.fails = true;
   EXPECT_EQ(run(6), "writing tallied log. yesterday=6");
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("not-filed"));
-  EXPECT_EQ(run(7), "no log for day 7: the statistics store could not be read; see the system log");
+  fake.submission.fails = false;
+  std::swap(fake.store.distributionsAreReadable, fake.store.scalarsAreReadable);
+  EXPECT_EQ(run(7), "a log for day 7" + inPart);
+  const std::string unreadable = ": the statistics store could not be read; see the system log";
+  EXPECT_EQ(run(8), "no log for day 8" + unreadable);
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("store-unreadable"));
+  std::swap(fake.store.distributionsAreReadable, fake.store.scalarsAreReadable);
+  EXPECT_EQ(run(9), "no log for day 9" + unreadable);
 }
 
 TEST_F(DailyRunTest, ReportsOnlyWithPermissionAndAfterTheCheckpoint) {

@@ -157,24 +157,6 @@ TEST_F(BHReportTest, TellsAboutAChangedOSVersionOnce) {
             (Dictionary{{"previous_os_version", "Pellio 7.1 (21A5)"}}));
 }
 
-TEST_F(BHReportTest, TellsWhetherAllStatisticsCouldBeRead) {
-  using Case = std::tuple<bool, bool, const char*, LogOutcome>;
-  for (const auto& [scalars, distributions, key, outcome] :
-       {Case(true, true, "raw", LogOutcome::Filed),
-        Case(true, true, "k", LogOutcome::NothingToReport),
-        Case(false, true, "raw", LogOutcome::FiledInPart),
-        Case(true, false, "raw", LogOutcome::FiledInPart),
-        Case(false, true, "k", LogOutcome::StoreUnreadable),
-        Case(true, false, "k", LogOutcome::StoreUnreadable)}) {
-    fake.store.scalarsAreReadable = scalars;
-    fake.store.distributionsAreReadable = distributions;
-    fake.store.scalars = {{key, kDay, 1}};
-    EXPECT_EQ(BHReport(fake.platform).writeLogForYesterday(kDay, {}), outcome);
-  }
-  fake.files.contents.clear();
-  EXPECT_EQ(BHReport(fake.platform).writeLogForYesterday(kDay, {}), LogOutcome::NoWhitelist);
-}
-
 TEST_F(BHReportTest, NamesTheConfigurationOfInternalDevices) {
   fake.preferences.domain(kTavrelDomain).set("LastOSVersion", fake.submission.osVersion);
   const auto optionsFor = [this](const plist::Value& answer) {

@@ -28,7 +28,7 @@ Dictionary sized(const Bytes& size, const Dictionary& fetch) {
 
 TEST(ConnectionTest, FetchesStatistics) {
   const Bytes buffer = statistics({{53, {0x20003}}, {4, {77}}});
-  const auto size = little32(static_cast<std::uint32_t>(buffer.size()));
+  const auto size = little32(buffer.size());
   const Dictionary whole{{"Request", request(13, 0)}, {"Output", Data(buffer)}};
   const Dictionary failing{{"Error", kKernelError}};
   const Dictionary good = driver(answering(buffer));

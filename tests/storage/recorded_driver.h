@@ -35,10 +35,14 @@ inline Bytes statistics(const std::vector<Record>& records) {
   return out;
 }
 
-inline Bytes little32(std::uint32_t value) {
-  Bytes out(4);
-  storeLittle32(out, 0, value);
+inline Bytes words(const std::vector<std::uint32_t>& values) {
+  Bytes out(values.size() * 4);
+  for (std::size_t i = 0; i < values.size(); ++i)
+    storeLittle32(out, i * 4, values[i]);
   return out;
+}
+inline Bytes little32(std::size_t value) {
+  return words({static_cast<std::uint32_t>(value)});
 }
 
 inline Data request(std::uint8_t selector, std::uint8_t flags) {
@@ -49,7 +53,7 @@ inline Data request(std::uint8_t selector, std::uint8_t flags) {
 }
 
 inline Array answering(const Bytes& buffer, int method = 8) {
-  const Data size(little32(static_cast<std::uint32_t>(buffer.size())));
+  const Data size(little32(buffer.size()));
   return {Dictionary{{"Method", method}, {"Request", request(13, 1)}, {"Output", size}},
           Dictionary{{"Method", method}, {"Request", request(13, 0)}, {"Output", Data(buffer)}}};
 }

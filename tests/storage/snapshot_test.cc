@@ -15,12 +15,7 @@ namespace {
 constexpr std::uint32_t kMost = std::numeric_limits<std::uint32_t>::max();
 
 std::string words(std::initializer_list<std::uint32_t> list) {
-  std::string text;
-  for (const std::uint32_t word : list) {
-    text.append(4, '\0');
-    storeLittle32(std::as_writable_bytes(std::span(text)), text.size() - 4, word);
-  }
-  return text;
+  return std::string(asText(fakes::words(list)));
 }
 
 struct Field {

@@ -10,18 +10,11 @@ namespace {
 
 using namespace fakes;
 
-Bytes words(const std::vector<std::uint32_t>& values) {
-  Bytes out(values.size() * 4);
-  for (std::size_t i = 0; i < values.size(); ++i)
-    storeLittle32(out, i * 4, values[i]);
-  return out;
-}
-
 struct Driver {
   Array methods = Array::create();
 
   void answer(std::uint8_t selector, const Bytes& list) {
-    query(selector, 0, {{"Output", Data(little32(static_cast<std::uint32_t>(list.size())))}});
+    query(selector, 0, {{"Output", Data(little32(list.size()))}});
     row(selector, 0, {{"Output", Data(list)}});
   }
   void query(std::uint8_t selector, std::uint8_t flags, const Dictionary& answer) {
