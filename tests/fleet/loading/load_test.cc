@@ -1,5 +1,4 @@
 #include <chrono>
-#include <csignal>
 #include <gtest/gtest.h>
 #include <set>
 #include <sqlite3.h>
@@ -39,6 +38,11 @@ class LoadTest : public ::testing::Test {
     device_.write("/" + path, content);
   }
 
+  /// Runs a shell's command in the folder of the files.
+  void shell(const std::string& command) const {
+    ASSERT_EQ(std::system(("cd " + at("") + " && " + command).c_str()), 0);
+  }
+
   Outcome run(std::vector<std::string> words) const {
     words.insert(words.begin(), {"--database", at("fleet.db"), "load"});
     std::istringstream in;
@@ -54,8 +58,8 @@ class LoadTest : public ::testing::Test {
     return text;
   }
 
-  /// The rows that a statement returns, sorted, with '|' between columns.
-  std::multiset<std::string> rows(const char* statement) const {
+  /// The starts of each log, with the versions and configuration of its metadata.
+  std::multiset<std::string> versions() const {
     sqlite3* database = nullptr;
     EXPECT_EQ(sqlite3_open(at("fleet.db").c_str(), &database), SQLITE_OK);
     std::multiset<std::string> found;
@@ -66,41 +70,13 @@ class LoadTest : public ::testing::Test {
       static_cast<std::multiset<std::string>*>(rows)->insert(row);
       return 0;
     };
-    EXPECT_EQ(sqlite3_exec(database, statement, take, &found, nullptr), SQLITE_OK)
+    constexpr const char* kStatement =
+        "SELECT s.value, os_version, previous_os_version, config_number FROM logs l JOIN "
+        "scalars s USING (log) WHERE s.key = 'app.starts'";
+    EXPECT_EQ(sqlite3_exec(database, kStatement, take, &found, nullptr), SQLITE_OK)
         << sqlite3_errmsg(database);
     sqlite3_close(database);
     return found;
-  }
-  std::multiset<std::string> versions() const {
-    return rows(
-        "SELECT s.value, os_version, previous_os_version, config_number FROM logs l JOIN "
-        "scalars s USING (log) WHERE s.key = 'com.example.starts'");
-  }
-  std::multiset<std::string> everything() const {
-    std::multiset<std::string> all;
-    for (const char* const statement :
-         {"SELECT l.digest, l.day, s.key, s.value FROM logs l JOIN scalars s USING (log)",
-          "SELECT l.digest, d.key, d.mean, d.count FROM logs l JOIN distributions d USING (log)",
-          "SELECT l.digest, c.key, c.label, c.count FROM logs l JOIN cells c USING (log)",
-          "SELECT l.digest, a.bundle, a.uuid FROM logs l JOIN applications a USING (log)"}) {
-      all.merge(rows(statement));
-    }
-    return all;
-  }
-
-  pid_t startLoader(const std::string& folder) const {
-    const std::string database = at("fleet.db");
-    const pid_t child = fork();
-    if (child == 0) {
-      execl(TAVREL_FLEET, TAVREL_FLEET, "--database", database.c_str(), "load", folder.c_str(),
-            nullptr);
-      _exit(127);
-    }
-    return child;
-  }
-  void writeMany(int logs) const {
-    for (int i = 0; i < logs; ++i)
-      write(format("many/%d/x-%d.log", i % 7, i), sampleLog(i));
   }
 
   TemporaryRoot device_;
@@ -191,11 +167,7 @@ TEST_F(LoadTest, TakesArchives) {
   write("in/d/e.log", sampleLog(4));
   write("in/d/e.metadata.plist", "<plist>");
   std::filesystem::create_symlink("a.log", at("in/d/link.log"));
-  const std::string pack = format(
-      "cd %s && tar -cf all.tar -C in d && tar -czf all.tgz -C in d && "
-      "head -c 2000 all.tar > cut.tar",
-      at(""));
-  ASSERT_EQ(std::system(pack.c_str()), 0);
+  shell("tar -cf all.tar -C in d && tar -czf all.tgz -C in d && head -c 2000 all.tar > cut.tar");
   const Outcome outcome = run({at("all.tar")});
   EXPECT_EQ(outcome.out, "2 loaded, 0 known, 2 refused; 1 without metadata\n");
   EXPECT_EQ(outcome.status, 1);
@@ -215,28 +187,22 @@ TEST_F(LoadTest, TakesArchives) {
   write("first.log", sampleLog(5));
   write("first.metadata.plist", kMetadata);
   const std::size_t content = (sampleLog(5).size() + 511) / 512 * 512;
-  const std::string early = format(
-      "cd %s && tar -cf early.tar first.log first.metadata.plist && head -c %zu early.tar > e.tar",
-      at(""), 512 + content + 100);
-  ASSERT_EQ(std::system(early.c_str()), 0);
+  shell(format("tar -cf early.tar first.log first.metadata.plist && head -c %zu early.tar > e.tar",
+               512 + content + 100));
   EXPECT_NE(run({at("e.tar")})
                 .error.find(
                     "refused: e.tar: first.log: its metadata may be in the rest of the archive\n"),
             std::string::npos);
   // A file of one gigabyte in an archive of a few kilobytes.
-  const std::string bomb =
-      format("cd %s && truncate -s 1G big.log && tar -cSf bomb.tar big.log", at(""));
-  ASSERT_EQ(std::system(bomb.c_str()), 0);
+  shell("truncate -s 1G big.log && tar -cSf bomb.tar big.log");
   EXPECT_EQ(run({at("bomb.tar")}).error,
             "tavrel-fleet: refused: bomb.tar: expands to more than 1000 times its size\n");
-  const std::string sidecars = format(
-      "cd %s && python3 -c 'import tarfile\n"
+  shell(
+      "python3 -c 'import tarfile\n"
       "with tarfile.open(\"many.tgz\", \"w:gz\", compresslevel=1, format=tarfile.GNU_FORMAT) as "
       "tar:\n"
       " for i in range(260): tar.addfile(tarfile.TarInfo(\"x\" * 2**19 + "
-      "f\"{i}.metadata.plist\"))'",
-      at(""));
-  ASSERT_EQ(std::system(sidecars.c_str()), 0);
+      "f\"{i}.metadata.plist\"))'");
   EXPECT_EQ(run({at("many.tgz")}).error,
             "tavrel-fleet: refused: many.tgz: its metadata takes more than 134217728 bytes: divide "
             "it into smaller archives\n");
@@ -292,13 +258,13 @@ TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
   const auto group = [](const char* scalars) {
     return format(
         "<plist version=\"1.0\"><dict><key>A</key><dict><key>ScalarKeys</key><dict>"
-        "<key>com.example.a&lt;b&amp;c</key><dict/></dict><key>ScalarKeyPrefixes</key>"
+        "<key>app.a&lt;b&amp;c</key><dict/></dict><key>ScalarKeyPrefixes</key>"
         "<dict>%s</dict></dict><key>InternalTesting</key><dict><key>DistributionKeyPrefixes"
-        "</key><dict><key>com.example.</key><dict/></dict></dict></dict></plist>",
+        "</key><dict><key>app.</key><dict/></dict></dict></dict></plist>",
         scalars);
   };
-  const std::string wide = group("<key>com.example.st</key><dict/>");
-  const std::string narrow = group("<key>com.example.st</key><true/>");
+  const std::string wide = group("<key>app.st</key><dict/>");
+  const std::string narrow = group("<key>app.st</key><true/>");
   const auto logOf = [](const std::string& whitelist, int starts) {
     std::string digest;
     appendHex(digest, LinuxDigest().md5(asBytes(whitelist)));
@@ -313,57 +279,13 @@ TEST_F(LoadTest, TakesOnlyWhatAWhitelistPermits) {
       run({at("in"), "--whitelist", at("wide.plist"), "--whitelist", at("narrow.plist")});
   EXPECT_EQ(
       outcome.error,
-      "tavrel-fleet: refused: in/2.log: BHScalars/com.example.starts: its whitelist does not "
+      "tavrel-fleet: refused: in/2.log: BHScalars/app.starts: its whitelist does not "
       "permit the key\n"
       "tavrel-fleet: refused: in/3.log: its whitelist \"eb42570d2e2f7addc42403d203dafde4\" is "
       "not among those given\n");
   EXPECT_EQ(outcome.out, "1 loaded, 0 known, 2 refused; 1 without metadata\n");
   EXPECT_EQ(run({at("in"), "--whitelist", at("in")}).error,
             "tavrel-fleet: whitelist in: is not a regular file\n");
-}
-
-TEST_F(LoadTest, LosesNothingAndCountsNothingTwiceWhenKilled) {
-  constexpr int kLogs = 600;
-  writeMany(kLogs);
-  ASSERT_EQ(run({at("many")}).out,
-            format("%d loaded, 0 known, 0 refused; %d without metadata\n", kLogs, kLogs));
-  const auto expected = everything();
-  const std::multiset<std::string> all = {std::to_string(kLogs)};
-  int killedMidway = 0;
-  for (std::uintmax_t round = 0; round < 8; ++round) {
-    if (rows("SELECT count(*) FROM log") == all) std::filesystem::remove(at("fleet.db"));
-    const pid_t loader = startLoader(at("many"));
-    const auto hasWritten = [&] {
-      std::error_code none;
-      const std::uintmax_t size = std::filesystem::file_size(at("fleet.db-wal"), none);
-      return !none && size > round * 32'768;
-    };
-    int status = 0;
-    pid_t ended = 0;
-    while ((ended = waitpid(loader, &status, WNOHANG)) == 0) {
-      if (hasWritten()) kill(loader, SIGKILL);
-    }
-    ASSERT_EQ(ended, loader);
-    if (WIFSIGNALED(status) && rows("SELECT count(*) > 0 FROM log").count("1") != 0) ++killedMidway;
-  }
-  EXPECT_GT(killedMidway, 0);
-  EXPECT_EQ(run({at("many")}).status, 0);
-  EXPECT_TRUE(everything() == expected);
-}
-
-TEST_F(LoadTest, FilesOnceWhatTwoLoadersBring) {
-  constexpr int kLogs = 2'500;
-  writeMany(kLogs);
-  const pid_t loaders[] = {startLoader(at("many")), startLoader(at("many"))};
-  for (const pid_t loader : loaders) {
-    int status = 0;
-    ASSERT_EQ(waitpid(loader, &status, 0), loader);
-    EXPECT_EQ(status, 0);
-  }
-  EXPECT_EQ(rows("SELECT count(*), count(DISTINCT digest) FROM log"),
-            (std::multiset<std::string>{format("%d|%d", kLogs, kLogs)}));
-  EXPECT_EQ(rows("SELECT count(*) FROM scalar"),
-            (std::multiset<std::string>{std::to_string(2 * kLogs)}));
 }
 
 TEST_F(LoadTest, HandsOutLargeLogsOneByOne) {

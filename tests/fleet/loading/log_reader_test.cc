@@ -48,14 +48,14 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
   const std::string expected =
       "20781 1795575845 os 'Pellio 4.2 (16R349)' before '' config 'CFG-7' whitelist "
       "'eb42570d2e2f7addc42403d203dafde4' task '' languages '' 'de-AT' region 'AT'\n"
-      "com.example.a<b&c -9223372036854775808\n"
-      "com.example.starts 12000\n"
-      "com.example.delay 1 250 67.875 44257.1875 4\n"
-      "com.example.load nan nan nan 0 1\n"
-      "com.example.delay (-inf, 2.5] -inf 2.5 1\n"
-      "com.example.delay (2.5, 100] 2.5 100 2\n"
-      "com.example.delay (100, inf) 100 inf 1\n"
-      "com.example.walk 1.2 8D1F6C0E-55B5-4B0A-9C6B-0D1A53F3A1C2 -7 3\n";
+      "app.a<b&c -9223372036854775808\n"
+      "app.starts 12000\n"
+      "app.delay 1 250 67.875 44257.1875 4\n"
+      "app.load nan nan nan 0 1\n"
+      "app.delay (-inf, 2.5] -inf 2.5 1\n"
+      "app.delay (2.5, 100] 2.5 100 2\n"
+      "app.delay (100, inf) 100 inf 1\n"
+      "app.walk 1.2 8D1F6C0E-55B5-4B0A-9C6B-0D1A53F3A1C2 -7 3\n";
   const auto document = plist::readXml(asBytes(kSampleLog));
   ASSERT_TRUE(document);
   const std::string binary = *plist::writeBinary(*document);
@@ -70,14 +70,13 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
       gzipped(kSampleLog.substr(0, 700)) + gzipped(kSampleLog.substr(700)),
       // Only a full XML reader accepts these.
       changed(kSampleLog, "<dict>", "<!-- a comment -->\r\n<dict>"),
-      changed(kSampleLog, "com.example.starts", "com.example.st&#97;rts"),
+      changed(kSampleLog, "app.starts", "app.st&#97;rts"),
       changed(kSampleLog, "<plist version", "<plist  version"),
       "\xEF\xBB\xBF" + kSampleLog,
       // Another order.
-      changed(changed(kSampleLog,
-                      "\t\t<key>com.example.starts</key>\n\t\t<integer>12000</integer>\n", ""),
+      changed(changed(kSampleLog, "\t\t<key>app.starts</key>\n\t\t<integer>12000</integer>\n", ""),
               "<key>BHScalars</key>\n\t<dict>\n",
-              "<key>BHScalars</key>\n\t<dict>\n<key>com.example.starts</key>"
+              "<key>BHScalars</key>\n\t<dict>\n<key>app.starts</key>"
               "<integer>12000</integer>"),
       // Parts that are not read may be anything.
       changed(kSampleLog, "<array/>", "<array><dict><key>a</key><true/></dict></array>"),
@@ -108,19 +107,18 @@ TEST(LogReaderTest, ReadsEachEncodingToTheSameRecord) {
 TEST(LogReaderTest, TellsLogsApartByAllThatTheySay) {
   LogReader reader;
   const auto digest = reader.read(asBytes(kSampleLog), nullptr)->digest;
-  const std::pair<const char*, const char*> changes[] = {
-      {"12000", "12001"},
-      {"com.example.starts", "com.example.start"},
-      {"44257.1875", "44257"},
-      {"04:05Z", "04:06Z"},
-      {"11-24T", "11-23T"},
-      {"de-AT", "de"},
-      {"<string>AT", "<string>"},
-      {"(no tasking id)", "t-7"},
-      {"eb42", "eb43"},
-      {">1.2<", ">1.3<"},
-      {"-7", "-8"},
-      {"(2.5, 100]", "(2.5, 99]"}};
+  const std::pair<const char*, const char*> changes[] = {{"12000", "12001"},
+                                                         {"app.starts", "app.start"},
+                                                         {"44257.1875", "44257"},
+                                                         {"04:05Z", "04:06Z"},
+                                                         {"11-24T", "11-23T"},
+                                                         {"de-AT", "de"},
+                                                         {"<string>AT", "<string>"},
+                                                         {"(no tasking id)", "t-7"},
+                                                         {"eb42", "eb43"},
+                                                         {">1.2<", ">1.3<"},
+                                                         {"-7", "-8"},
+                                                         {"(2.5, 100]", "(2.5, 99]"}};
   for (const auto& [old, replacement] : changes) {
     const auto record = reader.read(asBytes(changed(kSampleLog, old, replacement)), nullptr);
     ASSERT_TRUE(record) << record.error().message;
@@ -129,75 +127,51 @@ TEST(LogReaderTest, TellsLogsApartByAllThatTheySay) {
 }
 
 TEST(LogReaderTest, NamesWhatIsWrong) {
-  const struct {
-    const char* old;
-    const char* replacement;
-    const char* fault;
-  } cases[] = {
+  const char* const four = "<integer>4</integer>";
+  const std::string delay = "BHDistributions/app.delay: ";
+  const std::string histogram = "BHDistributionsHistogram/app.delay";
+  const std::tuple<const char*, const char*, std::string> cases[] = {
       {"BHCrashLogVersion", "BHOther", "is not a tallied log: it has no BHCrashLogVersion"},
       {"BHScalars", "BHOther", "is not a tallied log: it has no BHScalars"},
       {"<integer>1</integer>", "<integer>2</integer>",
        "BHCrashLogVersion: is a version that this program does not know"},
       {"BHTasking", "BHScalars", "BHScalars: occurs twice"},
       {"BHTasking</key>\n\t<array/>", "BHMetadata</key>\n\t<array/>", "BHMetadata: occurs twice"},
-      {"<integer>12000</integer>", "<real>12000</real>",
-       "BHScalars/com.example.starts: is not an integer"},
-      {"12000", "9223372036854775808", "BHScalars/com.example.starts: exceeds 64 bits with a sign"},
-      {"12000", "12x", "BHScalars/com.example.starts: \"12x\" is not a 64-bit integer"},
-      {"com.example.starts", "com.example.a&lt;b&amp;c",
-       "BHScalars/com.example.a<b&c: occurs twice"},
-      {"<key>com.example.load</key>", "<key>com.example.delay</key>",
-       "BHDistributions/com.example.delay: occurs twice"},
-      {"<real>1</real>", "", "BHDistributions/com.example.delay: is not an array of five numbers"},
-      {"<integer>4</integer>", "<real>4</real>",
-       "BHDistributions/com.example.delay: is not a summary whose count is an integer"},
-      {"<integer>4</integer>", "<integer>4</integer><integer>4</integer>",
-       "BHDistributions/com.example.delay: is not an array of five numbers"},
-      {"<integer>4</integer>", "<integer>-4</integer>",
-       "BHDistributions/com.example.delay: its count is negative"},
-      {"<integer>4</integer>", "<integer>2147483648</integer>",
-       "BHDistributions/com.example.delay: its count exceeds 31 bits"},
-      {"<integer>4</integer>", "<integer>0</integer>",
-       "BHDistributions/com.example.delay: its count is 0, and the other numbers are not"},
-      {"<integer>4</integer>", "<integer>1</integer>",
-       "BHDistributions/com.example.delay: its count is 1, and its numbers are not those of one "
-       "value"},
-      {"<integer>4</integer>", "<integer>5</integer>",
-       "BHDistributionsHistogram/com.example.delay: counts fewer values than its distribution has"},
+      {"<integer>12000</integer>", "<real>12000</real>", "BHScalars/app.starts: is not an integer"},
+      {"12000", "9223372036854775808", "BHScalars/app.starts: exceeds 64 bits with a sign"},
+      {"12000", "12x", "BHScalars/app.starts: \"12x\" is not a 64-bit integer"},
+      {"app.starts", "app.a&lt;b&amp;c", "BHScalars/app.a<b&c: occurs twice"},
+      {"<key>app.load</key>", "<key>app.delay</key>", delay + "occurs twice"},
+      {"<real>1</real>", "", delay + "is not an array of five numbers"},
+      {four, "<real>4</real>", delay + "is not a summary whose count is an integer"},
+      {four, "<integer>4</integer><integer>4</integer>", delay + "is not an array of five numbers"},
+      {four, "<integer>-4</integer>", delay + "its count is negative"},
+      {four, "<integer>2147483648</integer>", delay + "its count exceeds 31 bits"},
+      {four, "<integer>0</integer>", delay + "its count is 0, and the other numbers are not"},
+      {four, "<integer>1</integer>",
+       delay + "its count is 1, and its numbers are not those of one value"},
+      {four, "<integer>5</integer>", histogram + ": counts fewer values than its distribution has"},
       {"<key>(2.5, 100]</key>\n\t\t\t<integer>2", "<key>(2.5, 100]</key>\n\t\t\t<integer>3",
-       "BHDistributionsHistogram/com.example.delay: counts more values than its distribution has"},
+       histogram + ": counts more values than its distribution has"},
       {"<real>1</real>", "<real>nan</real>",
-       "BHDistributions/com.example.delay: only one of its minimum and maximum is not a number"},
-      {"<real>250</real>", "<real>0.5</real>",
-       "BHDistributions/com.example.delay: its minimum is above its maximum"},
-      {"67.875", "250.5",
-       "BHDistributions/com.example.delay: its mean is not between minimum and maximum"},
-      {"67.875", "inf",
-       "BHDistributions/com.example.delay: its mean is infinite, and its values are not"},
-      {"67.875", "nan",
-       "BHDistributions/com.example.delay: its mean is not a number, but its deviations are"},
-      {"44257.1875", "-1", "BHDistributions/com.example.delay: its deviations are negative"},
-      {"44257.1875", "4e5",
-       "BHDistributions/com.example.delay: its deviations are larger than its range allows"},
-      {"44257.1875", "nan",
-       "BHDistributions/com.example.delay: its deviations are not a number, but its mean is"},
-      {"44257.1875", "1e999",
-       "BHDistributions/com.example.delay: \"1e999\" is not a number in the range of a double"},
-      {"<dict>\n\t\t<key>com.example.delay</key>\n\t\t<dict>",
-       "<dict>\n\t\t<key>com.example.none</key>\n\t\t<dict>",
-       "BHDistributionsHistogram/com.example.none: has no distribution"},
-      {"(2.5, 100]", "2.5-100",
-       "BHDistributionsHistogram/com.example.delay/2.5-100: the label is not an interval"},
-      {"(2.5, 100]", "(100, 2.5]",
-       "BHDistributionsHistogram/com.example.delay/(100, 2.5]: the label is not an interval"},
-      {"(2.5, 100]", "(2.5, nan]",
-       "BHDistributionsHistogram/com.example.delay/(2.5, nan]: the label is not an interval"},
-      {"(2.5, 100]", "(2.5, 100)",
-       "BHDistributionsHistogram/com.example.delay/(2.5, 100): the label is not an interval"},
-      {"(2.5, 100]", "(2, 100]",
-       "BHDistributionsHistogram/com.example.delay: has buckets that overlap"},
-      {"(2.5, 100]", "(100, inf)",
-       "BHDistributionsHistogram/com.example.delay: has a bucket twice"},
+       delay + "only one of its minimum and maximum is not a number"},
+      {"<real>250</real>", "<real>0.5</real>", delay + "its minimum is above its maximum"},
+      {"67.875", "250.5", delay + "its mean is not between minimum and maximum"},
+      {"67.875", "inf", delay + "its mean is infinite, and its values are not"},
+      {"67.875", "nan", delay + "its mean is not a number, but its deviations are"},
+      {"44257.1875", "-1", delay + "its deviations are negative"},
+      {"44257.1875", "4e5", delay + "its deviations are larger than its range allows"},
+      {"44257.1875", "nan", delay + "its deviations are not a number, but its mean is"},
+      {"44257.1875", "1e999", delay + "\"1e999\" is not a number in the range of a double"},
+      {"<dict>\n\t\t<key>app.delay</key>\n\t\t<dict>",
+       "<dict>\n\t\t<key>app.none</key>\n\t\t<dict>",
+       "BHDistributionsHistogram/app.none: has no distribution"},
+      {"(2.5, 100]", "2.5-100", histogram + "/2.5-100: the label is not an interval"},
+      {"(2.5, 100]", "(100, 2.5]", histogram + "/(100, 2.5]: the label is not an interval"},
+      {"(2.5, 100]", "(2.5, nan]", histogram + "/(2.5, nan]: the label is not an interval"},
+      {"(2.5, 100]", "(2.5, 100)", histogram + "/(2.5, 100): the label is not an interval"},
+      {"(2.5, 100]", "(2, 100]", histogram + ": has buckets that overlap"},
+      {"(2.5, 100]", "(100, inf)", histogram + ": has a bucket twice"},
       {"<key>BHUserSetRegionFormat</key>\n\t\t<string>AT</string>", "<key>x</key>",
        "BHMetadata/x: the last key of a dictionary has no value"},
       {"<date>2026-11-25T03:04:05Z</date>", "<true/>", "BHLogCreationDate: is not a date"},
@@ -276,10 +250,10 @@ TEST(LogReaderTest, BoundsWhatALogMayCost) {
   std::string keys;
   for (std::size_t i = 0; i < limits::kLogRows; ++i)
     keys += "<key>k" + std::to_string(i) + "</key><integer>1</integer>";
-  EXPECT_EQ(faultIn(changed(kSampleLog, "<key>com.example.starts", keys + "<key>com.example.s")),
+  EXPECT_EQ(faultIn(changed(kSampleLog, "<key>app.starts", keys + "<key>app.s")),
             "BHScalars/k99993: the log has more than 100000 rows");
-  EXPECT_EQ(faultIn(changed(kSampleLog, "com.example.starts", std::string(5000, 'x'))),
-            "BHScalars/com.example.a<b&c: a key has more than 4096 bytes");
+  EXPECT_EQ(faultIn(changed(kSampleLog, "app.starts", std::string(5000, 'x'))),
+            "BHScalars/app.a<b&c: a key has more than 4096 bytes");
   std::string deep;
   for (int i = 0; i < 200; ++i)
     deep += "<array>";

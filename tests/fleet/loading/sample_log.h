@@ -1,95 +1,43 @@
 // A small valid log, and variations of its text.
 #pragma once
 
+#include <cmath>
 #include <gtest/gtest.h>
 #include <string>
 #include <string_view>
 #include <zlib.h>
 
+#include "base/iso_date.h"
+#include "platform/plist/xml.h"
+
 namespace tavrel::fleet {
 
-inline const std::string kSampleLog = R"(<?xml version="1.0" encoding="UTF-8"?>
-<plist version="1.0">
-<dict>
-	<key>BHActivatedAppInfo</key>
-	<array>
-		<dict>
-			<key>arch</key>
-			<integer>3</integer>
-			<key>bundle</key>
-			<string>com.example.walk</string>
-			<key>orboID</key>
-			<integer>-7</integer>
-			<key>uuid</key>
-			<string>8D1F6C0E-55B5-4B0A-9C6B-0D1A53F3A1C2</string>
-			<key>version</key>
-			<string>1.2</string>
-		</dict>
-	</array>
-	<key>BHCrashLogVersion</key>
-	<integer>1</integer>
-	<key>BHDistributions</key>
-	<dict>
-		<key>com.example.delay</key>
-		<array>
-			<real>1</real>
-			<real>250</real>
-			<real>67.875</real>
-			<real>44257.1875</real>
-			<integer>4</integer>
-		</array>
-		<key>com.example.load</key>
-		<array>
-			<real>nan</real>
-			<real>nan</real>
-			<real>nan</real>
-			<real>0</real>
-			<integer>1</integer>
-		</array>
-	</dict>
-	<key>BHDistributionsHistogram</key>
-	<dict>
-		<key>com.example.delay</key>
-		<dict>
-			<key>(-inf, 2.5]</key>
-			<integer>1</integer>
-			<key>(100, inf)</key>
-			<integer>1</integer>
-			<key>(2.5, 100]</key>
-			<integer>2</integer>
-		</dict>
-	</dict>
-	<key>BHLogCreationDate</key>
-	<date>2026-11-25T03:04:05Z</date>
-	<key>BHMetadata</key>
-	<dict>
-		<key>BHPreferredUserInterfaceLanguage</key>
-		<string>de-AT</string>
-		<key>BHUserInterfaceLanguage</key>
-		<string>&lt;unknown&gt;</string>
-		<key>BHUserSetRegionFormat</key>
-		<string>AT</string>
-	</dict>
-	<key>BHScalars</key>
-	<dict>
-		<key>com.example.a&lt;b&amp;c</key>
-		<integer>-9223372036854775808</integer>
-		<key>com.example.starts</key>
-		<integer>12000</integer>
-	</dict>
-	<key>BHStartDate</key>
-	<date>2026-11-24T00:00:00Z</date>
-	<key>BHTaskDigest</key>
-	<string>(no tasking digest)</string>
-	<key>BHTaskID</key>
-	<string>(no tasking id)</string>
-	<key>BHTasking</key>
-	<array/>
-	<key>BHWhitelistDigest</key>
-	<string>eb42570d2e2f7addc42403d203dafde4</string>
-</dict>
-</plist>
-)";
+/// As a device writes it.
+inline const std::string kSampleLog = *plist::writeXml(plist::Dictionary{
+    {"BHActivatedAppInfo",
+     plist::Array{plist::Dictionary{{"arch", 3},
+                                    {"bundle", "app.walk"},
+                                    {"orboID", -7},
+                                    {"uuid", "8D1F6C0E-55B5-4B0A-9C6B-0D1A53F3A1C2"},
+                                    {"version", "1.2"}}}},
+    {"BHCrashLogVersion", 1},
+    {"BHDistributions",
+     plist::Dictionary{{"app.delay", plist::Array{1.0, 250.0, 67.875, 44257.1875, 4}},
+                       {"app.load", plist::Array{NAN, NAN, NAN, 0.0, 1}}}},
+    {"BHDistributionsHistogram",
+     plist::Dictionary{
+         {"app.delay",
+          plist::Dictionary{{"(-inf, 2.5]", 1}, {"(100, inf)", 1}, {"(2.5, 100]", 2}}}}},
+    {"BHLogCreationDate", *parseIsoDate("2026-11-25T03:04:05Z")},
+    {"BHMetadata", plist::Dictionary{{"BHPreferredUserInterfaceLanguage", "de-AT"},
+                                     {"BHUserInterfaceLanguage", "<unknown>"},
+                                     {"BHUserSetRegionFormat", "AT"}}},
+    {"BHScalars", plist::Dictionary{{"app.a<b&c", INT64_MIN}, {"app.starts", 12000}}},
+    {"BHStartDate", *parseIsoDate("2026-11-24T00:00:00Z")},
+    {"BHTaskDigest", "(no tasking digest)"},
+    {"BHTaskID", "(no tasking id)"},
+    {"BHTasking", plist::Array::create()},
+    {"BHWhitelistDigest", "eb42570d2e2f7addc42403d203dafde4"}});
 
 /// `text` with the first `old` replaced.
 inline std::string changed(std::string text, std::string_view old, std::string_view replacement) {
