@@ -64,19 +64,18 @@ struct Device : DeviceServices {
     return lock;
   }
   UploadState state() { return readUploadState(files, coding, log, root.path(kUploadStateFile)); }
-  Outcome run(bool atOnce = false) { return run(atOnce, files); }
-  Outcome run(bool atOnce, FileSystem& fileSystem) {
-    return upload::Uploader({root, fileSystem, coding, preferences, clock, log}, configuration)
+  Outcome run(bool atOnce = false, FileSystem* otherFiles = nullptr) {
+    return upload::Uploader(
+               {root, otherFiles ? *otherFiles : files, coding, preferences, clock, log},
+               configuration)
         .run(atOnce);
   }
-  Outcome runAgainst(const ScriptedServer& server, bool atOnce = false) {
-    return runAgainst(server, atOnce, files);
-  }
-  Outcome runAgainst(const ScriptedServer& server, bool atOnce, FileSystem& fileSystem) {
+  Outcome runAgainst(const ScriptedServer& server, bool atOnce = false,
+                     FileSystem* otherFiles = nullptr) {
     configuration.url = server.url();
     configuration.host = "127.0.0.1";
     configuration.mayBePlain = true;
-    return run(atOnce, fileSystem);
+    return run(atOnce, otherFiles);
   }
   void use(const std::string& url, const std::string& folder, const std::string& authority,
            const std::string& certificate) {

@@ -120,7 +120,7 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   EXPECT_EQ(device.log.lines, Lines{"logs wait: there is no default route"});
   EXPECT_FALSE(fs::exists(device.root.path(kUploadStateFile)));
   NoTables noTables;
-  EXPECT_EQ(device.run(false, noTables), Outcome::Waits);
+  EXPECT_EQ(device.run(false, &noTables), Outcome::Waits);
   EXPECT_EQ(device.state().failure,
             "logs wait: cannot find a route: neither /proc/self/net/route nor "
             "/proc/self/net/ipv6_route exists; mount /proc");

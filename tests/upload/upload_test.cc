@@ -324,7 +324,7 @@ TEST(Upload, SendsWhatThePermissionIsAskedFor) {
     ++requests;
     return kOk;
   });
-  EXPECT_EQ(device.runAgainst(server, false, files), Outcome::Done);
+  EXPECT_EQ(device.runAgainst(server, false, &files), Outcome::Done);
   EXPECT_EQ(requests, 0) << "the log of a day that is not permitted, which another replaced";
   EXPECT_TRUE(device.log.says("logs of earlier days wait: 1"));
 }
@@ -346,7 +346,7 @@ TEST(Upload, MakesNoAttemptWhenPackingTakesTheTimeOfARun) {
     files.watched = device.root.path(kOutbox + nameOf(number) + ".metadata.plist");
     files.reach = [&] { device.configuration.run = std::chrono::seconds(0); };
     EXPECT_EQ(
-        device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, files),
+        device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, &files),
         Outcome::Waits);
     EXPECT_EQ(device.log.lines, lines);
     const UploadState state = device.state();
@@ -362,8 +362,9 @@ TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
   device.add(nameOf(2));
   WatchedFiles files;
   files.watched = device.root.path(kOutbox + nameOf(1) + ".log");
-  EXPECT_EQ(device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, files),
-            Outcome::Failed);
+  EXPECT_EQ(
+      device.runAgainst(ScriptedServer([](const std::string&) { return kOk; }), false, &files),
+      Outcome::Failed);
   const std::string line = "cannot remove " + files.watched + ": Input/output error";
   ASSERT_EQ(device.log.lines.size(), 1U);
   EXPECT_TRUE(device.log.lines[0].starts_with(line + "; next attempt after 2026-11-27T18:"));
