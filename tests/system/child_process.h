@@ -10,10 +10,11 @@
 
 namespace tavrel {
 
-/// Turns this process into the built daemon, on the device below `root`.
-[[noreturn]] inline void executeBelow(const std::string& root, const char* argument) {
+/// Turns this process into a built program, on the device below `root`.
+[[noreturn]] inline void executeBelow(const std::string& root, const char* argument,
+                                      const char* program = TAVREL_BINARY) {
   ::setenv("TAVREL_ROOT", root.c_str(), 1);
-  ::execl(TAVREL_BINARY, "tavrel", argument, nullptr);
+  ::execl(program, program, argument, nullptr);
   ::_exit(127);
 }
 

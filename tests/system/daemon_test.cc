@@ -242,11 +242,7 @@ TEST(HealthProgramTest, SaysWhatItCannotRead) {
   const TemporaryRoot device;
   const std::string errors = device.root.path("/errors");
   const auto run = [&](const std::string& root, int status, const char* argument = nullptr) {
-    const auto program = [&] {
-      ::setenv("TAVREL_ROOT", root.c_str(), 1);
-      ::execl(TAVREL_HEALTH_BINARY, "tavrel-health", argument, nullptr);
-      ::_exit(127);
-    };
+    const auto program = [&] { executeBelow(root, argument, TAVREL_HEALTH_BINARY); };
     EXPECT_EQ(waitFor(forkProcess(program, errors)), status);
     return loggedIn(errors);
   };
