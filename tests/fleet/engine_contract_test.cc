@@ -16,30 +16,20 @@ namespace {
 using testing::ElementsAre;
 using testing::UnorderedElementsAreArray;
 
-// Names databases that do not exist yet.
-class Site {
- public:
-  explicit Site(bool isServer) {
-    if (isServer) server_.emplace();
-  }
-  std::string where(const std::string& name = "fleet") const {
-    return server_ ? server_->address(name) : root_.root.path("/" + name);
-  }
-
- private:
-  TemporaryRoot root_;
-  std::optional<ClickhouseServer> server_;
-};
-
 class EngineContract : public testing::TestWithParam<bool> {
  protected:
-  std::unique_ptr<Engine> open(OpenMode mode = OpenMode::kWrite) const {
-    return openEngine(site.where(), mode);
+  EngineContract() {
+    if (GetParam()) server_.emplace();
   }
-  std::unique_ptr<Engine> openOther() const {
-    return openEngine(site.where("other"), OpenMode::kWrite);
+  std::unique_ptr<Engine> open(OpenMode mode = OpenMode::kWrite,
+                               const std::string& name = "fleet") const {
+    return openEngine(server_ ? server_->address(name) : root_.root.path("/" + name), mode);
   }
-  Site site{GetParam()};
+  std::unique_ptr<Engine> openOther() const { return open(OpenMode::kWrite, "other"); }
+
+ private:
+  const TemporaryRoot root_;
+  std::optional<ClickhouseServer> server_;
 };
 
 INSTANTIATE_TEST_SUITE_P(, EngineContract, testing::Bool(), [](const auto& instance) {
@@ -47,24 +37,6 @@ INSTANTIATE_TEST_SUITE_P(, EngineContract, testing::Bool(), [](const auto& insta
 });
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
-
-LogRecord fullRecord(std::uint64_t number) {
-  LogRecord record = makeRecord(number);
-  const auto value = static_cast<std::int64_t>(number);
-  record.scalars = {
-      {"a", value}, {"b", -value}, {std::string_view("über\n'\"\0\\", 10), INT64_MIN}};
-  record.distributions = {{"a", {1.5, 2.5, 2, 0.25, number}}};
-  record.cells = {{"a", -kInfinity, 1, "(-inf, 1]", number}, {"a", 1, kInfinity, "(1, inf)", 1}};
-  record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
-  return record;
-}
-
-std::vector<LogRecord> fullRecords(std::uint64_t first, std::uint64_t count) {
-  std::vector<LogRecord> records;
-  for (std::uint64_t number = first; number < first + count; ++number)
-    records.push_back(fullRecord(number));
-  return records;
-}
 
 TEST_P(EngineContract, HandsOutWhatWasAppended) {
   LogRecord record = makeRecord(1, -3);
@@ -105,14 +77,14 @@ TEST_P(EngineContract, HandsOutWhatWasAppended) {
 }
 
 TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
-  std::vector<LogRecord> records = fullRecords(0, 700);
+  std::vector<LogRecord> records = fullRecords(700);
   EXPECT_EQ(open()->append(records).added, 700u);
   const auto expected = rowsIn(*open());
   EXPECT_EQ(expected.size(), 4900u);
 
   const auto engine = openOther();
   std::shuffle(records.begin(), records.end(), std::mt19937(5));
-  records.push_back(fullRecord(3));
+  records.push_back(std::move(fullRecords(1, 3).front()));
   for (const auto& [first, count, known] :
        {std::array<std::size_t, 3>{0, 1, 0}, {0, 4, 1}, {4, 600, 0}, {500, 201, 105}}) {
     const auto appended = engine->append(std::span(records).subspan(first, count));
@@ -147,16 +119,16 @@ TEST_P(EngineContract, TakesManyLogsAtOnce) {
 
 TEST_P(EngineContract, PassesOnWhatAVisitorThrows) {
   const auto engine = open();
-  engine->append(fullRecords(0, 300));
+  engine->append(fullRecords(300));
   const auto fail = [](auto) { throw std::runtime_error("enough"); };
   EXPECT_THROW(engine->scalars("a", fail), std::runtime_error);
   EXPECT_THROW(engine->cells("a", fail), std::runtime_error);
-  EXPECT_EQ(engine->append(fullRecords(300, 1)).added, 1u);
+  EXPECT_EQ(engine->append(fullRecords(1, 300)).added, 1u);
   EXPECT_EQ(rowsIn(*engine).size(), 2107u);
 }
 
 TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {
-  const std::vector<LogRecord> records = fullRecords(0, 240);
+  const std::vector<LogRecord> records = fullRecords(240);
   std::array<std::size_t, 2> added{};
   {
     std::array<std::jthread, 2> loaders;

@@ -28,16 +28,6 @@ std::string openingFailure(const std::string& where, OpenMode mode = OpenMode::k
   return failureOf([&] { openEngine(where, mode); });
 }
 
-std::vector<LogRecord> records(std::uint64_t count) {
-  std::vector<LogRecord> records;
-  for (std::uint64_t number = 0; number < count; ++number) {
-    records.push_back(makeRecord(number));
-    records.back().scalars = {{"a", 1}, {"b", static_cast<std::int64_t>(number)}};
-    records.back().cells = {{"c", 0, 1, "(0, 1]", number}};
-  }
-  return records;
-}
-
 void appendInPortions(const std::string& where, const std::vector<LogRecord>& records) {
   const auto engine = openEngine(where, OpenMode::kWrite);
   for (std::size_t first = 0; first < records.size(); first += 8)
@@ -46,17 +36,17 @@ void appendInPortions(const std::string& where, const std::vector<LogRecord>& re
 
 // Kills loaders at later and later moments; the next loader completes what each has begun.
 void killLoaders(const std::function<std::string(std::size_t)>& whereOf) {
-  const std::vector<LogRecord> all = records(16);
+  const std::vector<LogRecord> all = fullRecords(16);
   appendInPortions(whereOf(0), all);
   const auto whole = rowsIn(*openEngine(whereOf(0), OpenMode::kRead));
-  ASSERT_EQ(whole.size(), 64u);
+  ASSERT_EQ(whole.size(), 112u);
   std::size_t kills = 0;
   for (std::size_t calls = 1; kills < 100; calls += 1 + calls / 12, ++kills) {
     const std::string where = whereOf(calls);
     if (!runUntilSystemCall(calls, [&] { appendInPortions(where, all); })) break;
     const auto engine = openEngine(where, OpenMode::kWrite);
     const auto left = rowsIn(*engine);
-    EXPECT_EQ(left.size() % 32, 0u) << calls;
+    EXPECT_EQ(left.size() % 56, 0u) << calls;
     EXPECT_THAT(left, IsSubsetOf(whole)) << calls;
     engine->append(all);
     ASSERT_EQ(rowsIn(*engine), whole) << calls;
@@ -123,11 +113,11 @@ TEST(EngineFaults, TakesEachNameForThatOfAFile) {
   for (const char* const name : {":memory:", "file:fleet.db"}) {
     std::size_t rows = 0;
     EXPECT_EQ(failureOf([&] {
-                appendInPortions(name, records(8));
+                appendInPortions(name, fullRecords(8));
                 rows = rowsIn(*openEngine(name, OpenMode::kRead)->reader()).size();
               }),
               "no failure");
-    EXPECT_EQ(rows, 32u) << name;
+    EXPECT_EQ(rows, 56u) << name;
   }
   std::filesystem::current_path(before);
 }
@@ -136,20 +126,20 @@ TEST(EngineFaults, LetsOtherUsersQuery) {
   if (geteuid() != 0) GTEST_SKIP() << "may not become another user";
   const TemporaryRoot root;
   const std::string path = root.root.path("/fleet.db");
-  appendInPortions(path, records(8));
+  appendInPortions(path, fullRecords(8));
   std::filesystem::permissions(root.root.path("/"), std::filesystem::perms(0755));
   for (const char* end : {"", "-wal", "-shm"})
     std::filesystem::permissions(path + end, std::filesystem::perms(0644));
   const auto failureOfAnother = [&] {
     EXPECT_EQ(seteuid(65534), 0);
     const std::string failure =
-        failureOf([&] { EXPECT_EQ(rowsIn(*openEngine(path, OpenMode::kRead)).size(), 32u); });
+        failureOf([&] { EXPECT_EQ(rowsIn(*openEngine(path, OpenMode::kRead)).size(), 56u); });
     EXPECT_EQ(seteuid(0), 0);
     return failure;
   };
   EXPECT_EQ(failureOfAnother(), "no failure");
   EXPECT_EQ(std::filesystem::file_size(path + "-wal"), 0u);
-  EXPECT_EQ(failureOf([&] { appendInPortions(path, records(8)); }), "no failure");
+  EXPECT_EQ(failureOf([&] { appendInPortions(path, fullRecords(8)); }), "no failure");
   std::filesystem::remove(path + "-wal");
   std::filesystem::remove(path + "-shm");
   EXPECT_EQ(failureOfAnother(),
@@ -207,7 +197,7 @@ TEST(EngineFaults, TellsWhatTheServerSays) {
 
 TEST(EngineFaults, WaitsForAServerThatStartsAgain) {
   ClickhouseServer server;
-  const std::vector<LogRecord> all = records(400);
+  const std::vector<LogRecord> all = fullRecords(400);
   const auto engine = openEngine(server.address("d"), OpenMode::kWrite);
   for (std::size_t first = 0; first < all.size(); first += 8) {
     std::jthread starter;

@@ -22,6 +22,21 @@ inline LogRecord makeRecord(std::uint64_t number, std::int32_t day = 20781) {
   return record;
 }
 
+/// Logs that have rows in every table; `first` is the number of the first.
+inline std::vector<LogRecord> fullRecords(std::uint64_t count, std::uint64_t first = 0) {
+  std::vector<LogRecord> records;
+  for (std::uint64_t number = first; number < first + count; ++number) {
+    LogRecord& record = records.emplace_back(makeRecord(number));
+    const auto value = static_cast<std::int64_t>(number);
+    record.scalars = {
+        {"a", value * 3}, {"b", -value}, {std::string_view("über\n'\"\0\\", 10), INT64_MIN}};
+    record.distributions = {{"a", {0.5, 1, 0.75, 0.125, number}}};
+    record.cells = {{"a", 0, 1, "(0, 1]", number}, {"a", 1, 2, "(1, 2]", 1}};
+    record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
+  }
+  return records;
+}
+
 inline std::string bitsOf(double value) {
   return std::to_string(std::bit_cast<std::uint64_t>(value));
 }

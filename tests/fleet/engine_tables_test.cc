@@ -8,27 +8,13 @@
 namespace tavrel::fleet {
 namespace {
 
-std::vector<LogRecord> records(std::uint64_t count) {
-  std::vector<LogRecord> records;
-  for (std::uint64_t number = 0; number < count; ++number) {
-    LogRecord record = makeRecord(number);
-    const auto value = static_cast<std::int64_t>(number);
-    record.scalars = {{"a", value * 3}, {"b", 1}};
-    record.distributions = {{"d", {0.5, 1, 0.75, 0.125, 2}}};
-    record.cells = {{"h", 0, 1, "(0, 1]", number}, {"h", 1, 2, "(1, 2]", 1}};
-    record.applications = {{"com.example", "1", "U", 1, 2}, {"com.example", "1", "U", 1, 2}};
-    records.push_back(std::move(record));
-  }
-  return records;
-}
-
 // Statements that run on both engines, and their answers for 600 logs.
 const std::pair<std::string, std::string> kQuestions[] = {
     {"SELECT count(*), min(day), sum(created) FROM logs", "600\t20781\t1077000179700\n"},
     {"SELECT sum(value), count(*) FROM scalars WHERE key = 'a'", "539100\t600\n"},
-    {"SELECT sum(minimum + maximum + mean + squared_deviations) FROM distributions WHERE key = 'd'",
+    {"SELECT sum(minimum + maximum + mean + squared_deviations) FROM distributions WHERE key = 'a'",
      "1425\n"},
-    {"SELECT label, sum(count), min(lower), max(upper) FROM cells WHERE key = 'h' GROUP BY label "
+    {"SELECT label, sum(count), min(lower), max(upper) FROM cells WHERE key = 'a' GROUP BY label "
      "ORDER BY label",
      "(0, 1]\t179700\t0\t1\n(1, 2]\t600\t1\t2\n"},
     {"SELECT bundle, sum(times) FROM applications GROUP BY bundle", "com.example\t1200\n"},
@@ -41,7 +27,7 @@ TEST(EngineTables, AnswerTheSameStatementsOnBothEngines) {
   const std::string path = root.root.path("/d");
   const ClickhouseServer server;
   for (const std::string& where : {path, server.address("d")})
-    openEngine(where, OpenMode::kWrite)->append(records(600));
+    openEngine(where, OpenMode::kWrite)->append(fullRecords(600));
   for (const char* end : {"", "-wal", "-shm"})
     EXPECT_EQ(std::filesystem::status(path + end).permissions(), std::filesystem::perms{0640});
   sqlite3* connection = nullptr;
@@ -80,17 +66,17 @@ TEST(EngineTables, AreSharedByTheServersOfACluster) {
   EXPECT_EQ(failure, one.address("d") +
                          ": not all servers of cluster pair have the tables: load into each one "
                          "once, without \"cluster\" in the address");
-  openEngine(two.address("d"), OpenMode::kWrite)->append(records(20));
+  openEngine(two.address("d"), OpenMode::kWrite)->append(fullRecords(20));
   const auto engine = openEngine(address, OpenMode::kWrite);
-  EXPECT_EQ(engine->append(records(600)).known, 20u);
+  EXPECT_EQ(engine->append(fullRecords(600)).known, 20u);
   // A loader that knows only one server files logs that another server has.
-  openEngine(one.address("d"), OpenMode::kWrite)->append(records(40));
+  openEngine(one.address("d"), OpenMode::kWrite)->append(fullRecords(40));
   EXPECT_NE(one.ask("SELECT count() FROM d.log"), "0\n");
   EXPECT_GT(std::stoi(two.ask("SELECT count() FROM d.log")), 20);
 
   const TemporaryRoot root;
   const auto file = openEngine(root.root.path("/d"), OpenMode::kWrite);
-  file->append(records(600));
+  file->append(fullRecords(600));
   EXPECT_EQ(rowsIn(*engine), rowsIn(*file));
   for (const auto& [question, expected] : kQuestions)
     EXPECT_EQ(one.ask(question, "d_pair"), expected) << question;

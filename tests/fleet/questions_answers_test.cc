@@ -1,16 +1,19 @@
 // Questions about whole fleets: what the answers contain, and what they must not reveal.
 #include <algorithm>
 #include <cmath>
+#include <deque>
 #include <gmock/gmock.h>
 #include <map>
 #include <random>
 
+#include "fleet/engine/open/open_engine.h"
 #include "fleet/pages/sections.h"
 #include "fleet/questions/compare.h"
 #include "fleet/questions/grouping.h"
 #include "fleet/questions/show.h"
 #include "fleet/questions/summary.h"
-#include "tests/fleet/questions_fleet.h"
+#include "tests/fleet/engine_records.h"
+#include "tests/platform/temporary_root.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -18,6 +21,35 @@ namespace {
 using testing::ElementsAre;
 
 constexpr double kInfinity = std::numeric_limits<double>::infinity();
+
+// A fleet in SQLite.
+class TestFleet {
+ public:
+  /// Adds a log, identified by the number of earlier logs; valid until the next one.
+  LogRecord& add(std::int32_t day, std::string_view version, std::string_view region = "DE") {
+    LogRecord& record = records_.emplace_back(makeRecord(records_.size(), day));
+    record.osVersion = record.texts.keep(version);
+    record.region = record.texts.keep(region);
+    return record;
+  }
+  Engine& engine() {
+    if (!records_.empty()) engine_->append(records_);
+    records_.clear();
+    return *engine_;
+  }
+  /// A new ledger of the logs so far.
+  Ledger& ledger(std::size_t devicesAtLeast) {
+    const LogTable& table = tables_.emplace_back(engine());
+    return ledgers_.emplace_back(table, devicesAtLeast);
+  }
+
+ private:
+  TemporaryRoot root_;
+  std::unique_ptr<Engine> engine_ = openEngine(root_.root.path("/fleet.db"), OpenMode::kWrite);
+  std::vector<LogRecord> records_;
+  std::deque<LogTable> tables_;
+  std::deque<Ledger> ledgers_;
+};
 
 std::vector<std::string> titles(const auto& groups) {
   std::vector<std::string> result;
@@ -37,8 +69,7 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
     }
   }
   fleet.add(3, "OS 4.9");
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 5);
+  Ledger& ledger = fleet.ledger(5);
   const ShowRequest request{.key = "s", .by = GroupBy::kRegion};
   const ShowAnswer answer = show(fleet.engine(), ledger, request);
   ASSERT_EQ(answer.sides.size(), 1u);
@@ -53,11 +84,9 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
   EXPECT_EQ(side.groups[0].histogram.pieces.front(), (Piece{15, 25, 12, 12}));
   EXPECT_EQ(side.whole.histogram.values, 80u);
 
-  Ledger strict(table, 21);
-  EXPECT_TRUE(show(fleet.engine(), strict, request).sides[0].groups.empty());
-  Ledger stricter(table, 41);
-  EXPECT_FALSE(show(fleet.engine(), stricter, request).sides[0].isShown);
-  Ledger again(table, 5);
+  EXPECT_TRUE(show(fleet.engine(), fleet.ledger(21), request).sides[0].groups.empty());
+  EXPECT_FALSE(show(fleet.engine(), fleet.ledger(41), request).sides[0].isShown);
+  Ledger& again = fleet.ledger(5);
   const ShowAnswer beside =
       show(fleet.engine(), again, {.key = "s", .days = {1, 1}, .againstDays = DayRange{2, 3}});
   EXPECT_EQ(beside.sides[1].whole.logs, 40u);
@@ -89,8 +118,7 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
   }
   fleet.add(1, "OS 1").distributions = {{"d", {}}};
   fleet.add(1, "OS 1").distributions = {{"d", {2, 40, std::nan(""), std::nan(""), 1}}};
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 5);
+  Ledger& ledger = fleet.ledger(5);
   const ShowAnswer answer =
       show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
   const ShownSet& whole = answer.sides[0].whole;
@@ -119,8 +147,7 @@ TEST(ShowTest, InventsNoValuesWhereCountsExceed64Bits) {
                     {"d", 1, 2, "(1, 2]", INT64_MAX},
                     {"d", 2, 3, "(2, 3]", 2}};
   }
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 5);
+  Ledger& ledger = fleet.ledger(5);
   const ShowAnswer answer =
       show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
   EXPECT_EQ(answer.sides[0].whole.histogram.pieces.front().lower, 0);
@@ -136,8 +163,7 @@ TEST(ShowTest, TellsNoMeanOfFewDevices) {
                                : "OS 3")
         .distributions = {{"d", {0, kInfinity, mean, 0, 1}}};
   }
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 5);
+  Ledger& ledger = fleet.ledger(5);
   const ShowAnswer answer = show(fleet.engine(), ledger,
                                  {.key = "d", .kind = KeyKind::kDistribution, .by = GroupBy::kOs});
   const ShowSide& side = answer.sides[0];
@@ -222,8 +248,7 @@ TEST(PrivacyTest, NothingSmallFollowsFromTwoDivisions) {
         .whitelistDigest = device < 25                                   ? "d3"
                            : device < 50 || device == 60 || device >= 98 ? "d2"
                                                                          : "d1";
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 10);
+  Ledger& ledger = fleet.ledger(10);
   const SummaryAnswer answer = summarise(fleet.engine(), ledger, {});
   EXPECT_THAT(titles(answer.parts[1].groups), ElementsAre("DE 50/50", "FR 25/25", "US 25/25"));
   // d1 is FR and US without three logs.
@@ -244,8 +269,7 @@ TEST(PrivacyTest, NothingSmallFollowsFromTwoDivisions) {
         record.whitelistDigest = record.texts.keep("d" + std::to_string(digest));
       }
     }
-    const LogTable logs(any.engine());
-    Ledger fresh(logs, 3 + random() % 8);
+    Ledger& fresh = any.ledger(3 + random() % 8);
     const std::vector<Division> divisions = divisionsOf(fresh);
     for (const Division& division : divisions)
       groups += division.groups.size();
@@ -265,8 +289,7 @@ TEST(PrivacyTest, AChainOfManyGroupsIsJoined) {
       while (devices-- > 0)
         fleet.add(1, std::to_string(100 + version), std::to_string(100 + region));
   }
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 5);
+  Ledger& ledger = fleet.ledger(5);
   const auto regions = titles(summarise(fleet.engine(), ledger, {}).parts[1].groups);
   EXPECT_EQ(regions.back(), "(other) 24/24") << "100 and 101 less both versions: one device";
 }
@@ -288,8 +311,7 @@ TEST(PrivacyTest, JoinsTheSameGroupsInWhateverOrderTheLogsWereLoaded) {
     TestFleet fleet;
     for (const auto& [version, region] : logs)
       fleet.add(1, version, region);
-    const LogTable table(fleet.engine());
-    Ledger ledger(table, 5);
+    Ledger& ledger = fleet.ledger(5);
     EXPECT_THAT(titles(summarise(fleet.engine(), ledger, {}).parts[1].groups),
                 ElementsAre("r04 20/20", "(other) 54/54"));
     std::shuffle(logs.begin(), logs.end(), random);
@@ -303,8 +325,7 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
   LogRecord& talkative = fleet.add(1, "4.2");
   for (int key = 0; key < 45; ++key)
     talkative.scalars.push_back({talkative.texts.keep("a" + std::to_string(key)), 1});
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 10);
+  Ledger& ledger = fleet.ledger(10);
   const FleetPage page = askForPage(fleet.engine(), ledger, {});
   expectNothingSmallFollows(ledger);
   EXPECT_THAT(titles(page.summary.parts[0].groups), ElementsAre("4.1 25/25", "4.2 16/16"));
@@ -318,8 +339,7 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
   EXPECT_FALSE(show(fleet.engine(), ledger, {.key = "s"}).sides[0].isShown) << "all less the shown";
 
   fleet.add(2, "4.2").scalars = {{"rare", 1}};
-  const LogTable later(fleet.engine());
-  const SummaryAnswer summary = summarise(fleet.engine(), *std::make_unique<Ledger>(later, 10), {});
+  const SummaryAnswer summary = summarise(fleet.engine(), fleet.ledger(10), {});
   EXPECT_EQ(summary.whole.lastDay, 1) << "the second day has one device";
   EXPECT_EQ(summary.scalarKeys, 1u);
 }
@@ -329,8 +349,7 @@ TEST(PrivacyTest, APageSaysWhichDaysItJoins) {
   for (const auto& [day, devices] : {std::pair(1, 12), {2, 12}, {3, 11}, {4, 5}})
     for (int device = 0; device < devices; ++device)
       fleet.add(day, "1");
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 10);
+  Ledger& ledger = fleet.ledger(10);
   const std::string page = textOf(askForPage(fleet.engine(), ledger, {}));
   EXPECT_EQ(page.find("1970-01-03"), std::string::npos) << "the chart ends before the last day";
   EXPECT_THAT(page, testing::HasSubstr("Without 2 days, so that nothing reveals groups of fewer "
@@ -353,8 +372,7 @@ TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
         if (random() % 5 != 0) record.scalars = {{"s", static_cast<std::int64_t>(random() % 50)}};
       }
     }
-    const LogTable table(fleet.engine());
-    Ledger ledger(table, 3 + random() % 8);
+    Ledger& ledger = fleet.ledger(3 + random() % 8);
     summarise(fleet.engine(), ledger, {});
     const auto by = static_cast<GroupBy>(random() % 5);
     ShowRequest request{.key = "s", .by = by};
@@ -427,8 +445,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
       if (device < 10) record.scalars.push_back({"rare", 1});
     }
   }
-  const LogTable table(fleet.engine());
-  Ledger ledger(table, 10);
+  Ledger& ledger = fleet.ledger(10);
   EXPECT_EQ(newestVersions(ledger, {})->second, "2");
   const CompareAnswer answer = compare(fleet.engine(), ledger, {"1", "2", {}});
   std::vector<std::string> found;
@@ -463,8 +480,7 @@ TEST(CompareTest, TakesNoDayOfADeviceForAnotherDevice) {
       for (std::int32_t day = device % 5; day < 20; ++day)
         fleet.add(day, device < 12 ? "1" : "2").scalars = {{"s", value}};
     }
-    const LogTable table(fleet.engine());
-    Ledger ledger(table, 10);
+    Ledger& ledger = fleet.ledger(10);
     const auto answer = compare(fleet.engine(), ledger, {"1", "2", {}});
     wrong += answer.comparisons.at(0).isSignificant() ? 1 : 0;
   }

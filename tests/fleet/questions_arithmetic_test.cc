@@ -27,13 +27,6 @@ struct Term {
   std::uint64_t count;
 };
 
-ExactMoments momentsOf(const std::vector<Term>& terms) {
-  ExactMoments moments;
-  for (const Term& term : terms)
-    moments.add(term.mean, term.squaredDeviations, term.count);
-  return moments;
-}
-
 // The expected numbers are quotients of Python's fractions.Fraction, rounded by int / int.
 TEST(ExactMomentsTest, AreTheNearestDoublesInAnyOrder) {
   struct Case {
@@ -68,7 +61,9 @@ TEST(ExactMomentsTest, AreTheNearestDoublesInAnyOrder) {
   for (Case one : cases) {
     for (int shuffle = 0; shuffle < 4; ++shuffle) {
       SCOPED_TRACE(one.mean);
-      const ExactMoments moments = momentsOf(one.terms);
+      ExactMoments moments;
+      for (const Term& term : one.terms)
+        moments.add(term.mean, term.squaredDeviations, term.count);
       EXPECT_EQ(bitsOf(moments.mean()), bitsOf(one.mean));
       EXPECT_EQ(bitsOf(moments.squaredDeviations()), bitsOf(one.squaredDeviations));
       std::shuffle(one.terms.begin(), one.terms.end(), random);

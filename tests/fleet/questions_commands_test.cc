@@ -10,6 +10,7 @@
 #include "fleet/commands/csv_writer.h"
 #include "fleet/commands/show_output.h"
 #include "fleet/fleet_tool.h"
+#include "tests/fakes/command_line.h"
 #include "tests/fleet/clickhouse_server.h"
 #include "tests/fleet/engine_records.h"
 
@@ -25,7 +26,7 @@ struct Output {
   std::string error;
 };
 
-Output run(const std::string& database, std::vector<std::string> arguments,
+Output run(const std::string& database, CommandLine arguments,
            std::optional<std::size_t> columns = std::nullopt) {
   arguments.insert(arguments.begin(), {"--database", database});
   std::istringstream in;
@@ -67,21 +68,17 @@ std::vector<LogRecord> records() {
   return all;
 }
 
-struct Question {
-  const char* name;
-  std::vector<std::string> arguments;
-};
-const Question kQuestions[] = {
-    {"summary", {"summary", "--json"}},
-    {"keys", {"summary", "--keys", "--csv"}},
-    {"distribution", {"show", kSlow, "--by", "os", "--json", "--days", "2"}},
-    {"both kinds", {"show", "=sum", "--by", "region", "--csv"}},
-    {"buckets", {"show", kSlow, "--by", "os", "--csv", "--buckets"}},
-    {"against", {"show", kSlow, "--against", "4.10"}},
-    {"days", {"show", kSlow, "--days", "2026-11-23..", "--against", "..2026-11-22", "--json"}},
-    {"compare", {"compare", "4.9", "4.10", "--json"}},
-    {"text", {"compare", "4.9", "4.10", "--all"}},
-    {"page", {"page", "-o", "-"}}};
+const CommandLine kQuestions[] = {
+    "summary --json",
+    "summary --keys --csv",
+    {"show", kSlow, "--by", "os", "--json", "--days", "2"},
+    "show =sum --by region --csv",
+    {"show", kSlow, "--by", "os", "--csv", "--buckets"},
+    {"show", kSlow, "--against", "4.10"},
+    {"show", kSlow, "--days", "2026-11-23..", "--against", "..2026-11-22", "--json"},
+    "compare 4.9 4.10 --json",
+    "compare 4.9 4.10 --all",
+    "page -o -"};
 
 class QuestionCommands : public testing::Test {
  protected:
@@ -101,8 +98,8 @@ TEST_F(QuestionCommands, AnswerInTheSameBitsOnBothEnginesInAnyOrder) {
   ClickhouseServer server;
   const std::string address = server.address("fleet");
   load(address, 3);
-  for (const auto& [name, arguments] : kQuestions) {
-    SCOPED_TRACE(name);
+  for (const CommandLine& arguments : kQuestions) {
+    SCOPED_TRACE(testing::PrintToString(arguments));
     const Output answer = run(file, arguments);
     EXPECT_EQ(answer.status, 0) << answer.error;
     EXPECT_EQ(run(shuffled, arguments).out, answer.out);
@@ -155,7 +152,7 @@ TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
 
 TEST_F(QuestionCommands, TellWhatChanged) {
   load(file, 1);
-  const auto compared = nlohmann::json::parse(run(file, {"compare", "4.9", "4.10", "--json"}).out);
+  const auto compared = nlohmann::json::parse(run(file, "compare 4.9 4.10 --json").out);
   EXPECT_EQ(compared["format_version"], 1);
   EXPECT_EQ(compared["old_version"], kOld);
   const auto& first = compared["comparisons"][0];
@@ -177,10 +174,10 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_EQ(side["all"]["values"], 840);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["above"], 100);
   EXPECT_EQ(side["all"]["histogram"]["buckets"][1]["at_most"], nullptr);
-  EXPECT_THAT(run(file, {"compare", "4.9", "4.10"}).out,
+  EXPECT_THAT(run(file, "compare 4.9 4.10").out,
               HasSubstr("OS 4.9 (A) -> OS 4.10 (B), all days: 2 of 5 statistics changed\n"));
-  EXPECT_EQ(run(file, {"compare", "4.9", "4.10", "--all"}).out.find(" -0 "), std::string::npos);
-  const std::string csv = run(file, {"show", "=sum", "--by", "region", "--csv"}).out;
+  EXPECT_EQ(run(file, "compare 4.9 4.10 --all").out.find(" -0 "), std::string::npos);
+  const std::string csv = run(file, "show =sum --by region --csv").out;
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,scalar,all days,all,,40,120,0,120,1152921504606846976,"
                              "1152921504606846976,1152921504606846976,0,0,1152921504606846976,,,"));
   EXPECT_THAT(csv, HasSubstr("\r\n'=sum,distribution,all days,value,(other),13,39,3,78,0,1,"));
@@ -190,7 +187,7 @@ TEST_F(QuestionCommands, TellWhatChanged) {
   EXPECT_THAT(buckets, HasSubstr(",all days,all,,,100,480,480\r\n"));
   EXPECT_THAT(buckets, HasSubstr(",all days,value,OS 4.10 (B),100,,180,180\r\n"));
 
-  const std::string page = run(file, {"page", "-o", "-"}).out;
+  const std::string page = run(file, "page -o -").out;
   EXPECT_THAT(page, HasSubstr("2 of 5 statistics changed"));
   const std::regex sentence("Chance alone would show");
   EXPECT_EQ(std::distance(std::sregex_iterator(page.begin(), page.end(), sentence), {}), 2);
@@ -209,7 +206,7 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
                     {kKey, 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
   }
   openEngine(file, OpenMode::kWrite)->append(all);
-  const std::string page = run(file, {"page", "-o", "-"}).out;
+  const std::string page = run(file, "page -o -").out;
   for (const char* bar : {"\"1000.2 to 1000.4: 20\"", "\"1000.4 to 1000.6: 20\""})
     EXPECT_THAT(page, HasSubstr(std::string("aria-label=") + bar));
   EXPECT_THAT(page, HasSubstr(", many values per log (milliseconds)</p>"));
@@ -238,7 +235,7 @@ TEST_F(QuestionCommands, PagesAreBounded) {
     }
   }
   openEngine(file, OpenMode::kWrite)->append(all);
-  const std::string page = run(file, {"page", "-o", "-"}).out;
+  const std::string page = run(file, "page -o -").out;
   for (const char* text :
        {">tavrel-fleet compare lists 11 more changes.<",
         ">tavrel-fleet show --buckets prints the histograms, which have 1,002 buckets.<",
@@ -251,7 +248,7 @@ TEST_F(QuestionCommands, PagesAreBounded) {
 
 TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   load(file, 1);
-  const std::string shown = run(file, {"show", "=sum", "--by", "region"}, 64).out;
+  const std::string shown = run(file, "show =sum --by region", 64).out;
   EXPECT_THAT(shown,
               HasSubstr("\n                  DEVICES  MINIMUM        MEAN  MAXIMUM  NO MEAN\n"
                         "  (all)                40  "));
@@ -260,7 +257,7 @@ TEST_F(QuestionCommands, CutNoNamesOnNarrowTerminals) {
   EXPECT_THAT(shown, HasSubstr("\n  No room for STD DEVIATION, LOGS, VALUES, 25 %, 75 %, MINIMUM, "
                                "MAXIMUM, 5 %, 95 %: widen the terminal\n"));
   EXPECT_THAT(shown, HasSubstr("\n  NO MEAN counts logs that means and deviations leave out"));
-  const std::string compared = run(file, {"compare", "4.9", "4.10", "--all"}, 80).out;
+  const std::string compared = run(file, "compare 4.9 4.10 --all", 80).out;
   EXPECT_THAT(compared, HasSubstr("\n=sum  "));
   EXPECT_THAT(compared, HasSubstr("  scalar  "));
   EXPECT_EQ(compared.find("…"), std::string::npos);
@@ -275,9 +272,9 @@ TEST_F(QuestionCommands, ShareBracketsInTheManualOnlyIfAllExcludeEachOther) {
 TEST_F(QuestionCommands, CompleteInBash) {
   load(file, 1);
   const std::string folder = root.root.path("");
-  root.write("/versions", run(file, {"completion", "versions"}).out);
-  const std::string script = run(file, {"completion", "bash"}).out +
-                             "tavrel-fleet() { echo \"$@\" > " + folder + "/asked; cat " + folder +
+  root.write("/versions", run(file, "completion versions").out);
+  const std::string script = run(file, "completion bash").out + "tavrel-fleet() { echo \"$@\" > " +
+                             folder + "/asked; cat " + folder +
                              "/versions; }\n"
                              "COMP_WORDS=($(sed 's/[:=]\\+/ & /g' <<< \"$COMP_LINE\"))\n"
                              "[[ $COMP_LINE != *' ' ]] || COMP_WORDS+=('')\n"
@@ -307,8 +304,8 @@ TEST_F(QuestionCommands, CompleteInBash) {
 
 TEST_F(QuestionCommands, CompleteFromTheNamedDatabaseInOtherShells) {
   const std::string folder = root.root.path("");
-  root.write("/script.zsh", run(file, {"completion", "zsh"}).out);
-  root.write("/script.fish", run(file, {"completion", "fish"}).out);
+  root.write("/script.zsh", run(file, "completion zsh").out);
+  root.write("/script.fish", run(file, "completion fish").out);
   root.write("/tavrel-fleet", "#!/bin/sh\necho \"$@\" > " + folder + "/asked\n");
   std::filesystem::permissions(folder + "/tavrel-fleet", std::filesystem::perms::owner_all);
   const std::string asks = "PATH=" + folder + ":$PATH ";
@@ -350,71 +347,48 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   rare.osVersion = "OS 9";
   rare.scalars = {{"rare", 1}};
   openEngine(file, OpenMode::kWrite)->append({&rare, 1});
-  const struct {
-    std::vector<std::string> arguments;
-    int status;
-    const char* message;
-  } cases[] = {
-      {{"show", "x\x1b"},
-       1,
-       "statistic \"x\\x1b\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
-       "summary --keys lists the statistics"},
-      {{"show", "rare", "--days", "1"},
-       1,
-       "statistic \"rare\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
-       "summary --keys lists the statistics"},
-      {{"show", "=sum", "--against", "1"},
-       2,
+  const std::string few =
+      " is in no log, or in logs of fewer than 10 devices: tavrel-fleet summary";
+  const std::tuple<CommandLine, int, std::string> cases[] = {
+      {"show x\x1b", 1, "statistic \"x\\x1b\"" + few + " --keys lists the statistics"},
+      {"show rare --days 1", 1, "statistic \"rare\"" + few + " --keys lists the statistics"},
+      {"show =sum --against 1", 2,
        "--against: 2026-11-24 and all days overlap: choose separate days with --days; for a "
        "version, write more of its name"},
-      {{"show", "=sum", "--devices-at-least", "5000", "--days", "1", "--against", "2026-11-20"},
-       1,
+      {"show =sum --devices-at-least 5000 --days 1 --against 2026-11-20", 1,
        "fewer than 5000 devices: nothing is shown"},
-      {{"show", "=sum", "--against", "5.0"},
-       1,
-       "version \"5.0\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
-       "summary lists the versions"},
-      {{"compare", "OS 9", "4.10"},
-       1,
-       "version \"OS 9\" is in no log, or in logs of fewer than 10 devices: tavrel-fleet "
-       "summary lists the versions"},
-      {{"compare", "OS", "4.10"},
-       1,
+      {"show =sum --against 5.0", 1, "version \"5.0\"" + few + " lists the versions"},
+      {{"compare", "OS 9", "4.10"}, 1, "version \"OS 9\"" + few + " lists the versions"},
+      {"compare OS 4.10", 1,
        "version \"OS\" is part of several versions: write one of them in full"},
-      {{"compare", "4.9", "4.9"}, 2, "OLD and NEW are the same version: name two"},
-      {{"summary", "--days", "0"},
-       2,
+      {"compare 4.9 4.9", 2, "OLD and NEW are the same version: name two"},
+      {"summary --days 0", 2,
        "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
        "or a number of days"},
-      {{"summary", "--devices-at-least", "2"},
-       2,
+      {"summary --devices-at-least 2", 2,
        "--devices-at-least: 2 is too few: in groups of fewer than 3 devices, one owner "
        "can work out the figures of another"}};
   for (const auto& [arguments, status, message] : cases) {
     const Output output = run(file, arguments);
-    EXPECT_EQ(output.error, "tavrel-fleet: " + std::string(message) + "\n");
+    EXPECT_EQ(output.error, "tavrel-fleet: " + message + "\n");
     EXPECT_EQ(output.status, status);
     EXPECT_EQ(output.out, "");
   }
-  for (std::vector<std::string> arguments :
-       std::vector<std::vector<std::string>>{{"summary", "--json"},
-                                             {"page", "-o", "-"},
-                                             {"show", "=sum"},
-                                             {"compare", "4.9", "4.10"}}) {
-    SCOPED_TRACE(arguments[0]);
-    arguments.insert(arguments.end(), {"--devices-at-least", "41"});
-    const Output all = run(file, arguments);
-    arguments.insert(arguments.end(), {"--days", "7"});
-    const Output some = run(file, arguments);
+  for (const char* const question :
+       {"summary --json", "page -o -", "show =sum", "compare 4.9 4.10"}) {
+    SCOPED_TRACE(question);
+    const std::string strict = std::string(question) + " --devices-at-least 41";
+    const Output all = run(file, strict);
+    const Output some = run(file, strict + " --days 7");
     EXPECT_EQ(some.out, all.out);
     EXPECT_EQ(some.error, all.error);
     EXPECT_EQ(some.status, all.status);
   }
-  EXPECT_EQ(run(file, {"summary", "--days", "7", "--devices-at-least", "41"}).out,
+  EXPECT_EQ(run(file, "summary --days 7 --devices-at-least 41").out,
             "All logs: fewer than 41 devices: nothing is shown\n");
-  EXPECT_EQ(run(file, {"summary", "--keys", "--devices-at-least", "41"}).out,
+  EXPECT_EQ(run(file, "summary --keys --devices-at-least 41").out,
             "no statistic of at least 41 devices\n");
-  const Output against = run(file, {"show", "=sum", "--against", "7", "--devices-at-least", "41"});
+  const Output against = run(file, "show =sum --against 7 --devices-at-least 41");
   EXPECT_EQ(against.error, "tavrel-fleet: fewer than 41 devices: nothing is shown\n");
   EXPECT_EQ(against.status, 1);
   for (const auto& [where, message] :
@@ -424,14 +398,14 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
         {"clickhouse://h/d?a=b",
          "the database's address has the unknown option \"a\": give cluster, password-file, "
          "ca-file, timeout or retries"}}) {
-    const Output output = run(where, {"summary"});
+    const Output output = run(where, "summary");
     EXPECT_EQ(output.error, "tavrel-fleet: --database: " + std::string(message) +
                                 ": see 'tavrel-fleet summary --help'\n");
     EXPECT_EQ(output.status, 2);
   }
   const std::string empty = root.root.path("/empty.db");
   openEngine(empty, OpenMode::kWrite);
-  EXPECT_EQ(run(empty, {"summary"}).error,
+  EXPECT_EQ(run(empty, "summary").error,
             "tavrel-fleet: " + empty + ": holds no logs: load some with tavrel-fleet load\n");
 }
 
