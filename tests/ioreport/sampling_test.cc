@@ -106,8 +106,8 @@ TEST(SamplesTest, TakesTheFirstWholeGroupOfEachChannel) {
       {"A1 B1 C1", "A0+1 B1+1 C2+1 "}, {"A2 B1 C1", "A0+2 C2+1 "},
       {"B3 A1 C1", "B0+3 "},           {"B4 A1 C1", ""},
       {"A1 C65535 B1", "A0+1 "},       {"C1 B2 A1 A1", "A3+1 B1+2 C0+1 "},
-      {"A1 A2 A1", "A0+1 "},           {"a1 A1 c2 C1", "A1+1 "},
-      {"X1 Y2 A1 B2 A1", "B3+2 "}};
+      {"A1 A2 A1", "A0+1 "},           {"c2 C1 A1", "A2+1 "},
+      {"a1 A1 c2 C1", "A1+1 "},        {"X1 Y2 A1 B2 A1", "B3+2 "}};
   for (const auto& [elements, expected] : kCases) {
     std::vector<std::byte> buffer;
     std::istringstream words(elements);
