@@ -22,21 +22,14 @@ std::string isoAgo(double seconds) {
   return isoDateText(plist::Date::sinceEpoch(std::floor(ago(seconds).secondsSinceEpoch())));
 }
 
-/// The name of a log that was filed `seconds` ago.
-std::string logName(double seconds) {
-  std::string stamp = isoAgo(seconds);
-  std::erase_if(stamp, [](char c) { return c == '-' || c == ':'; });
-  return "log-tallied-" + stamp + "-0011aabb";
-}
-
-struct CheckTest : testing::Test {
-  const TemporaryDevice device{};
+struct CheckTest : DeviceTest {
+  CheckTest() { writeRun(kHour, true); }
 
   /// Expects the line of one check, without the times in its text.
   void expect(const std::string& line, int status) const {
     const Outcome outcome = device.run("status --check");
     EXPECT_EQ(outcome.status, status) << outcome;
-    EXPECT_NE(("\n" + outcome.out).find("\n" + line), std::string::npos) << line << '\n' << outcome;
+    expectIn("\n" + outcome.out, {"\n" + line});
   }
 
   void writeRun(double finishedAgo, bool isFinished, int errors = 0) const {
@@ -54,7 +47,6 @@ struct CheckTest : testing::Test {
 };
 
 TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
-  writeRun(kHour, true);
   device.check("status --check",
                prints("OK permission: the daily log may not leave the device\n"
                       "OK clock: today is day " +
@@ -82,7 +74,6 @@ TEST_F(CheckTest, HasALineForEachThingAndTheGravestStateAsStatus) {
 }
 
 TEST_F(CheckTest, OutputThatCannotBePrintedHidesNoFinding) {
-  writeRun(kHour, true);
   device.write("/w.plist", xmlOf("{}"));
   const auto statusOf = [&](CommandLine command) {
     std::istringstream in;
@@ -99,15 +90,14 @@ TEST_F(CheckTest, OutputThatCannotBePrintedHidesNoFinding) {
   EXPECT_EQ(statusOf("whitelist diff " + file + " " + file), 2);
   EXPECT_EQ(statusOf("whitelist check " + file), 2);
   EXPECT_EQ(statusOf("status --check"), 3);
-  device.write("/run/tavrel/health/nvme0.plist",
-               xmlOf(R"({"version": 1, "name": "nvme0", "kind": "nvme", "time": {"$date": ")" +
-                     isoAgo(kHour) + R"("}, "figures": {"critical_warning": 1}})"));
+  device.writeDrive("nvme0", "nvme", R"("critical_warning": 1)", isoAgo(kHour));
   EXPECT_EQ(statusOf("status --check"), 2);
   EXPECT_EQ(statusOf("disks"), 8 | 1);
 }
 
 TEST_F(CheckTest, TellsHowTheLastRunsWent) {
   const std::string run = "last-run: the daily run of day 20000 (2024-10-04)";
+  std::filesystem::remove(device.path(kLastRunFile));
   expect("UNKNOWN last-run: no run yet", 3);
   writeRun(kHour, false);
   expect("WARNING " + run +
@@ -125,7 +115,6 @@ TEST_F(CheckTest, TellsHowTheLastRunsWent) {
 }
 
 TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
-  writeRun(kHour, true);
   device.write(kWhitelistFile, "<plist>");
   expect("WARNING last-log: the next run: no log for day " + std::to_string(today() - 1) + " (" +
              isoAgo(kDay).substr(0, 10) + "): no permission for that day; " +
@@ -163,7 +152,6 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
 }
 
 TEST_F(CheckTest, JudgesTheLastLog) {
-  writeRun(kHour, true);
   device.write(kWhitelistFile, xmlOf("{}"));
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
   const std::string own = "prefs set com.norvane.tallied.tavrel ";
@@ -193,18 +181,15 @@ TEST_F(CheckTest, JudgesTheLastLog) {
 }
 
 TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
-  writeRun(kHour, true);
-  const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
   std::string values;
   for (int i = 0; i < 3000; ++i)
     values += "scalar\t20000\tcom.example.key." + std::to_string(i) + "\t1\n";
   device.run("stat import -", values);
   expect("OK store: ", 0);
-  device.write(store + ".corrupt-1", "");
-  device.write(store + "-kept", "");
+  device.write(kStore + ".corrupt-1", "");
+  device.write(kStore + "-kept", "");
   expect("WARNING store: ", 1);
-  EXPECT_NE(device.run("status --check").out.find("; no damage; 1 damaged store set aside in "),
-            std::string::npos);
+  expectIn(device.run("status --check").out, {"; no damage; 1 damaged store set aside in "});
   device.write("/etc/tavrel/limits.plist", "garbage");
   expect("WARNING limits: nothing removed early since yesterday; " +
              device.path("/etc/tavrel/limits.plist"),
@@ -218,12 +203,12 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
       "WARNING limits: nothing removed early since yesterday; 'tavrelctl tidy' failed 3 h ago: no "
       "room\n",
       1);
-  std::string bytes = contentOf(device.path(store)) + contentOf(device.path(store + "-wal"));
+  std::string bytes = contentOf(device.path(kStore)) + contentOf(device.path(kStore + "-wal"));
   ASSERT_GT(bytes.size(), 100'000U);
-  std::filesystem::remove(device.path(store + "-wal"));
-  std::filesystem::remove(device.path(store + "-shm"));
+  std::filesystem::remove(device.path(kStore + "-wal"));
+  std::filesystem::remove(device.path(kStore + "-shm"));
   bytes.resize(100'000, 'x');
-  device.write(store, "SQLite format 3" + bytes);
+  device.write(kStore, "SQLite format 3" + bytes);
   expect("CRITICAL store: ", 2);
 }
 
@@ -246,20 +231,20 @@ TEST(CheckReadOnly, IsOfTheFileSystemNotOfTheMount) {
 }
 
 TEST_F(CheckTest, JudgesQueuesByTheirOldestLog) {
-  writeRun(kHour, true);
   for (const auto& [place, age, line, status] :
        {std::tuple("pending", 3 * kHour, "OK queue pending: 1 log, the oldest filed 3 h ago\n", 0),
         {"pending", 50 * kHour, "WARNING queue pending: 2 logs, the oldest filed 2 days ago\n", 1},
         {"outbox", 8 * kDay, "CRITICAL queue outbox: 1 log, the oldest filed 8 days ago\n", 2},
         {"withheld", 900 * kDay, "OK queue withheld: 1 log, the oldest filed 900 days ago\n", 2},
         {"refused", kHour, "WARNING queue refused: 1 log, the oldest filed 60 min ago\n", 2}}) {
-    device.fileLog(std::string(place) + "/" + logName(age), "", "{}");
+    std::string filed = isoAgo(age);
+    std::erase_if(filed, [](char c) { return c == '-' || c == ':'; });
+    device.fileLog(format("%s/log-tallied-%s-0011aabb", std::string(place), filed), "", "{}");
     expect(line, status);
   }
 }
 
 TEST_F(CheckTest, TellsFailuresOfUploadsLimitsAndLosses) {
-  writeRun(kHour, true);
   const auto state = [&](double success, int failed) {
     device.write(
         "/var/lib/tavrel/upload/state.plist",
@@ -312,18 +297,15 @@ TEST_F(CheckTest, JudgesNothingThatThisUserCannotSee) {
 }
 
 TEST_F(CheckTest, ShowsTheVerdictOfEachDisk) {
-  writeRun(kHour, true);
-  const auto reading = [&](const std::string& figures) {
-    device.write("/run/tavrel/health/nvme0.plist",
-                 xmlOf(R"({"version": 1, "name": "nvme0", "kind": "nvme", "time": {"$date": ")" +
-                       isoAgo(3 * kHour) + R"("}, "figures": {)" + figures + "}}"));
-  };
-  reading(R"("used_pct": 3)");
-  expect("OK disk nvme0: good, read 3 h ago\n", 0);
-  reading(R"("used_pct": 100)");
-  expect("WARNING disk nvme0: worn, used_pct is 100, read 3 h ago\n", 1);
-  reading(R"("critical_warning": 1)");
-  expect("CRITICAL disk nvme0: failing, critical_warning is 1, read 3 h ago\n", 2);
+  const std::tuple<const char*, const char*, int> kCases[] = {
+      {R"("used_pct": 3)", "OK disk nvme0: good, read 3 h ago\n", 0},
+      {R"("used_pct": 100)", "WARNING disk nvme0: worn, used_pct is 100, read 3 h ago\n", 1},
+      {R"("critical_warning": 1)",
+       "CRITICAL disk nvme0: failing, critical_warning is 1, read 3 h ago\n", 2}};
+  for (const auto& [figures, line, status] : kCases) {
+    device.writeDrive("nvme0", "nvme", figures, isoAgo(3 * kHour));
+    expect(line, status);
+  }
 }
 
 }  // namespace

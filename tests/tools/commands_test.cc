@@ -98,10 +98,10 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
     EXPECT_EQ(error.str(), line);
   }
   device.check("--version", prints(format("tavrelctl %s\n", version())));
-  EXPECT_NE(device.run("prefs set --help").out.find("\n\nKind of VALUE, at most one:\n  --string "),
-            std::string::npos);
-  for (const auto& help : {"--help", "prefs set --help", "log --help"})
-    EXPECT_NE(device.run(help).out.find("Usage: "), std::string::npos) << help;
+  expectIn(device.run("prefs set --help").out,
+           {"Usage: ", "\n\nKind of VALUE, at most one:\n  --string "});
+  for (const auto& help : {"--help", "log --help"})
+    expectIn(device.run(help).out, {"Usage: "});
 }
 
 TEST(Prefs, KeepTheKindThatWasAskedFor) {
@@ -232,38 +232,41 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
                fails(none + "19999 (2024-10-03): no value found for any whitelisted key"));
   const Outcome verbose = device.run("log preview --day 20000 -v");
   EXPECT_EQ(verbose.out.size(), xml.out.size());
-  EXPECT_NE(verbose.error.find("info: writing tallied log. yesterday=20000\n"), std::string::npos)
-      << verbose.error;
+  expectIn(verbose.error, {"info: writing tallied log. yesterday=20000\n"});
   EXPECT_EQ(device.files(), before);
 
   // Output that a failure makes incomplete counts as a failure.
-  const std::string preferences = device.path("/var/mobile/Library/Preferences/");
-  const std::string kept = contentOf(preferences + "com.norvane.tallied.plist");
-  std::ofstream(preferences + "com.norvane.tallied.plist") << "junk";
+  const std::string preferences =
+      device.path("/var/mobile/Library/Preferences/com.norvane.tallied.plist");
+  const std::string kept = contentOf(preferences);
+  const std::string noList =
+      ": not a property list: it begins neither with \"bplist00\" nor with \"<\"";
+  std::ofstream(preferences) << "junk";
   const Outcome incomplete = device.run("log preview --day 20000");
   EXPECT_EQ(incomplete.status, 1);
-  EXPECT_EQ(incomplete.error, "tavrelctl: cannot read preferences " + preferences +
-                                  "com.norvane.tallied.plist: not a property list: it begins "
-                                  "neither with \"bplist00\" nor with \"<\"; repair it, or the "
-                                  "next write sets it aside\n");
+  EXPECT_EQ(incomplete.error, "tavrelctl: cannot read preferences " + preferences + noList +
+                                  "; repair it, or the next write sets it aside\n");
   EXPECT_EQ(device.run("log preview --day 20000 -v").status, 1);
-  std::ofstream(preferences + "com.norvane.tallied.plist") << kept;
+  std::ofstream(preferences) << kept;
 
-  std::filesystem::remove(device.path(kWhitelistFile));
-  device.check(
-      "log preview --day 20000",
-      fails(none + "20000 (2024-10-04): cannot read " + device.path(kWhitelistFile) +
-            ": No such file or directory: write a whitelist, as docs/whitelist.md describes it"));
-  device.write(kWhitelistFile, "junk");
-  device.check("log preview --day 20000",
-               fails(none + "20000 (2024-10-04): " + device.path(kWhitelistFile) +
-                     ": not a property list: it begins neither with \"bplist00\" nor with \"<\": "
-                     "repair it, or replace it with another whitelist"));
+  // What each content of the whitelist's file is to a preview; empty for none.
+  const std::pair<const char*, std::string> kFaults[] = {
+      {"", "cannot read " + device.path(kWhitelistFile) +
+               ": No such file or directory: write a whitelist, as docs/whitelist.md describes it"},
+      {"junk",
+       device.path(kWhitelistFile) + noList + ": repair it, or replace it with another whitelist"}};
+  const auto setWhitelist = [&](const std::string& content) {
+    std::filesystem::remove(device.path(kWhitelistFile));
+    if (!content.empty()) device.write(kWhitelistFile, content);
+  };
+  for (const auto& [content, fault] : kFaults) {
+    setWhitelist(content);
+    device.check("log preview --day 20000", fails(none + "20000 (2024-10-04): " + fault));
+  }
 
   fill(device);
   LinuxPlatform(device.root).store().BHClientCheckpoint();
-  device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb",
-               "not a database, and long enough to be taken for a damaged one");
+  device.write(kStore, "not a database, and long enough to be taken for a damaged one");
   const auto damaged = device.files();
   const Outcome outcome = device.run("log preview --day 20000");
   EXPECT_TRUE(outcome.error.ends_with("; the next run sets it aside\n")) << outcome;
@@ -273,18 +276,10 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   // Neither fault hides the other.
   const std::string noLog = "tavrelctl: " + none + "20000 (2024-10-04): ";
   ASSERT_TRUE(outcome.error.starts_with(noLog)) << outcome;
-  for (const bool isMissing : {true, false}) {
-    std::filesystem::remove(device.path(kWhitelistFile));
-    if (!isMissing) device.write(kWhitelistFile, "junk");
-    const std::string fault =
-        isMissing ? "cannot read " + device.path(kWhitelistFile) +
-                        ": No such file or directory: write a whitelist, as docs/whitelist.md "
-                        "describes it\n"
-                  : device.path(kWhitelistFile) +
-                        ": not a property list: it begins neither with \"bplist00\" nor with "
-                        "\"<\": repair it, or replace it with another whitelist\n";
+  for (const auto& [content, fault] : kFaults) {
+    setWhitelist(content);
     EXPECT_EQ(device.run("log preview --day 20000").error,
-              "tavrelctl: " + outcome.error.substr(noLog.size()) + noLog + fault);
+              "tavrelctl: " + outcome.error.substr(noLog.size()) + noLog + fault + "\n");
   }
 }
 
@@ -311,8 +306,9 @@ TEST(LogList, SaysWhichLogCannotBeRead) {
                fails("not a log: " + empty + ": it is empty: 'tavrelctl log list' shows the logs"));
 }
 
-TEST(LogShow, SaysWhyThereIsNoLog) {
-  const TemporaryDevice device;
+using LogShow = DeviceTest;
+
+TEST_F(LogShow, SaysWhyThereIsNoLog) {
   const std::string own = "com.norvane.tallied.tavrel ";
   const std::string dayKey = own + "LastCrashLogSerializationDateInDaysSince1970";
   device.run("prefs set " + dayKey + " 2000000000 --int");
@@ -325,8 +321,6 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
        next + "no usable whitelist; see 'tavrelctl whitelist check'"},
       {"delete " + dayKey, "last daily run: none yet"},
       {"set " + dayKey + " 20001 --int", "last daily run: day 20001 (2024-10-05), outcome unknown"},
-      {"set " + own + "LastLogOutcome nothing-to-report",
-       "last daily run: no log for day 20001 (2024-10-05): no value found for any whitelisted key"},
       {"set " + own + "LastLogOutcome filed", "last daily run: a log for day 20001 (2024-10-05)"}};
   for (const auto& [change, why] : kCases) {
     if (change.starts_with("delete")) device.write(kWhitelistFile, xmlOf("{}"));
@@ -336,8 +330,7 @@ TEST(LogShow, SaysWhyThereIsNoLog) {
   }
 }
 
-TEST(LogShow, DrawsTheTableOfASubmittedLog) {
-  const TemporaryDevice device;
+TEST_F(LogShow, DrawsTheTableOfASubmittedLog) {
   const std::string pending = device.path(kSubmission) + "pending/";
   device.check("log list", prints("no logs\n"));
   device.check("log show nothing",
@@ -444,8 +437,7 @@ line two
       "BHDistributionsHistogram/c: has no summary in BHDistributions",
       "BHOther: is not part of a tallied log",
       "BHScalars: is a string, not a dictionary"])"_json);
-  EXPECT_NE(device.run("log show").out.find("\nFormat faults (6)\n  BHDistributions/b: is no"),
-            std::string::npos);
+  expectIn(device.run("log show").out, {"\nFormat faults (6)\n  BHDistributions/b: is no"});
   device.check("log show " + other,
                fails("not a tallied log: " + other + ": 'tavrelctl plist show FILE' shows it"));
   // Only a forced run reports the day on which it files the log.
@@ -483,23 +475,21 @@ TEST(Status, SaysWhatMayBeDoneWasDoneAndIsHeld) {
   device.write(kSubmission + "pending/x.log", "text");
   const Outcome outcome = device.run("status");
   EXPECT_EQ(outcome.status, 0) << outcome;
-  for (const auto& line :
-       {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
-        "Last OS version  none yet\n", " KiB, day 20000 (2024-10-04)\n",
-        "Outbox logs      0\nLast daily run   day 20001 (2024-10-05), outcome unknown\n"}) {
-    EXPECT_NE(outcome.out.find(line), std::string::npos) << line << outcome;
-  }
-  const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");
+  expectIn(outcome.out,
+           {"Submission       allowed\n", "Last day done    20001 (2024-10-05)\n",
+            "Last OS version  none yet\n", " KiB, day 20000 (2024-10-04)\n",
+            "Outbox logs      0\nLast daily run   day 20001 (2024-10-05), outcome unknown\n"});
+  const std::string store = device.path(kStore);
   EXPECT_EQ(device.json("status")["store"]["bytes"],
             std::filesystem::file_size(store) + std::filesystem::file_size(store + "-wal"));
 
   std::filesystem::remove(store);
   std::filesystem::create_symlink("/none", store);
   const Outcome linked = device.run("status");
-  EXPECT_NE(linked.out.find("\nStore            unreadable\n"), std::string::npos) << linked;
+  expectIn(linked.out, {"\nStore            unreadable\n"});
   EXPECT_EQ(linked.error,
             "tavrelctl: statistics store " + store + ": is a symbolic link: move it away\n");
-  EXPECT_NE(device.run("status --check").out.find("\nCRITICAL store: "), std::string::npos);
+  expectIn(device.run("status --check").out, {"\nCRITICAL store: "});
 }
 
 }  // namespace

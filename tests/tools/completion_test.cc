@@ -1,12 +1,8 @@
 // Completions and the manual page, which are generated from the tool's commands.
-#include <set>
-
-#include "device.h"
+#include "help.h"
 
 namespace tavrel {
 namespace {
-
-using Words = std::set<std::string>;
 
 /// What bash completes at the end of a command line, with the built tool in PATH. Like bash, the
 /// script splits words at colons and equals signs.
@@ -31,27 +27,6 @@ Words completeInBash(const TemporaryDevice& device, const std::string& line) {
     if (!word.empty()) words.insert(word);
   return words;
 }
-
-/// The commands and options that the help of `path` lists.
-struct Help {
-  Words commands, options;
-
-  Help(const TemporaryDevice& device, const std::string& path) {
-    std::istringstream lines(device.run(path + " --help").out);
-    bool isOfCommands = false;
-    for (std::string line; std::getline(lines, line);) {
-      if (!line.starts_with(' ')) isOfCommands = line == "Subcommands:";
-      std::istringstream words(line);
-      std::string word;
-      words >> word;
-      // Lines that are indented further are only descriptions.
-      if (!line.starts_with("  ") || line.find_first_not_of(' ') > 6) continue;
-      if (isOfCommands) commands.insert(word);
-      for (std::istringstream names(word); std::getline(names, word, ',');)
-        if (word.starts_with('-') && word != "-h") options.insert(word);
-    }
-  }
-};
 
 void expectAll(const TemporaryDevice& device, const std::string& path, int& commands) {
   const Help help(device, path);
@@ -80,14 +55,15 @@ void expectAll(const TemporaryDevice& device, const std::string& path, int& comm
   }
 }
 
-TEST(CompletionTest, HasEveryCommandAndOption) {
-  const TemporaryDevice device;
+using CompletionTest = DeviceTest;
+
+TEST_F(CompletionTest, HasEveryCommandAndOption) {
   int commands = 0, shells = 0;
   expectAll(device, "", commands);
   EXPECT_GE(commands, 60);
   for (const char* const shell : {"zsh", "fish"}) {
     const std::string script = device.run(std::string("completion ") + shell).out;
-    EXPECT_NE(script.find("manufacturer-id"), script.npos) << shell;
+    expectIn(script, {"manufacturer-id"});
     const std::string has = std::string("command -v ") + shell + " > /dev/null";
     const std::string parses =
         std::string(shell) + " -n " TAVREL_BUILD "/completions/" + shell + "/*tavrelctl*";
@@ -95,15 +71,12 @@ TEST(CompletionTest, HasEveryCommandAndOption) {
     EXPECT_EQ(std::system(parses.c_str()), 0) << shell;
     ++shells;
   }
-  const std::string zsh = device.run("completion zsh").out;
-  for (const char* const spec : {"'(--root)--root=[Folder that holds", "--day=["})
-    EXPECT_NE(zsh.find(spec), zsh.npos) << spec;
+  expectIn(device.run("completion zsh").out, {"'(--root)--root=[Folder that holds", "--day=["});
   EXPECT_EQ(device.run("--help").out.find("completion"), std::string::npos);
   if (shells == 0) GTEST_SKIP() << "neither fish nor zsh: their syntax is not checked";
 }
 
-TEST(CompletionTest, CompletesValues) {
-  const TemporaryDevice device;
+TEST_F(CompletionTest, CompletesValues) {
   device.run("stat import -",
              "scalar\ttoday\tcom.example.a\t1\nvalue\tyesterday\tcom.example.b\t1\t"
              "1\nscalar\ttoday\tcom.$(touch x)\t1\nscalar\t20000\tcom.old\t1\n"
@@ -131,8 +104,7 @@ TEST(CompletionTest, CompletesValues) {
   EXPECT_EQ(completeInBash(device, "stat list --day 2").size(), 31U);
 }
 
-TEST(CompletionTest, MakesThePageOfATemplate) {
-  const TemporaryDevice device;
+TEST_F(CompletionTest, MakesThePageOfATemplate) {
   const std::string file = device.path("/page.in");
   device.write("/page.in",
                ".SH COMMANDS\n@command send force\n@command send deliver\nProse.\n"

@@ -9,9 +9,8 @@ namespace {
 namespace fs = std::filesystem;
 
 const std::string kSwitch = "com.norvane.zentrix DiagnosticSubmissionEnabled";
-const std::string kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
 
-struct Consent : testing::Test {
+struct Consent : DeviceTest {
   Consent() {
     today = device.json("status")["today"]["day"];
     device.write(kWhitelistFile, "<plist>");
@@ -45,7 +44,6 @@ struct Consent : testing::Test {
     return false;
   }
 
-  TemporaryDevice device;
   std::int32_t today = 0;
 };
 
@@ -59,9 +57,8 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   const auto status = device.json("status");
   EXPECT_EQ(status["submission_allowed"], true);
   EXPECT_EQ(status["submission_first_day"]["day"], today + 1);
-  EXPECT_NE(device.run("status").out.find("no log for day " + text(today - 1) + ": submission is " +
-                                          allowed(today + 1)),
-            std::string::npos);
+  expectIn(device.run("status").out,
+           {"no log for day " + text(today - 1) + ": submission is " + allowed(today + 1)});
   device.check(
       "allow --from yesterday",
       {0, "submission is " + allowed(today - 1) + "\n",
@@ -70,23 +67,17 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   // A clock that is behind the recorded statistics.
   device.run("deny");
   device.run("stat import", format("scalar\t%d\tk\t1\n", today + 5));
-  EXPECT_NE(device.run("allow --json").error.find("submission begins after it"), std::string::npos);
+  expectIn(device.run("allow --json").error, {"submission begins after it"});
   device.check("allow", {0, "submission is already " + allowed(today + 6) + "\n",
                          "tavrelctl: today is " + text(today) +
                              ": 'tavrelctl allow --from DAY' names an earlier day\n"});
-  EXPECT_NE(
-      device.run("status --check")
-          .out.find("WARNING permission: the daily log may leave the device, from day " +
-                    text(today + 6) + " on: 'tavrelctl allow --from DAY' names an earlier day\n"),
-      std::string::npos);
+  expectIn(device.run("status --check").out,
+           {"WARNING permission: the daily log may leave the device, from day " + text(today + 6) +
+            " on: 'tavrelctl allow --from DAY' names an earlier day\n"});
   fs::remove(device.path(kWhitelistFile));
-  EXPECT_NE(
-      device.run("allow --from today")
-          .error.find(
-              "tavrelctl: no log is made yet: cannot read " + device.path(kWhitelistFile) +
-              ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
-              "it\n"),
-      std::string::npos);
+  expectIn(device.run("allow --from today").error,
+           {"tavrelctl: no log is made yet: cannot read " + device.path(kWhitelistFile) +
+            ": No such file or directory: write a whitelist, as docs/whitelist.md describes it\n"});
   device.run("deny");
   ASSERT_TRUE(KeptValues(device.path(kStore)).add({{0, today + 7, 1, "k"}}));
   EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 8);
@@ -112,8 +103,7 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
   EXPECT_EQ(device.json("status")["submission_first_day"]["day"], today + 1) << "nothing changed";
   device.run("prefs set " + kSwitch + " false --bool");
   fileLogs({"pending/log-tallied-1"});
-  EXPECT_NE(device.run("allow").error.find("1 waiting log of an earlier permission deleted"),
-            std::string::npos);
+  expectIn(device.run("allow").error, {"1 waiting log of an earlier permission deleted"});
   device.run("prefs delete " + kSwitch);
   device.run("prefs set " + kSwitch + " true --bool");
   EXPECT_EQ(device.json("status")["submission_first_day"], nullptr);
@@ -159,15 +149,12 @@ TEST_F(Consent, DeniesWhereverItIsKilled) {
 
 TEST_F(Consent, ShowsWhatIsWithheld) {
   fileLogs({"withheld/StorageStatus-1"});
-  EXPECT_NE(device.run("status").out.find("Withheld logs    1, never sent\n"), std::string::npos);
+  expectIn(device.run("status").out, {"Withheld logs    1, never sent\n"});
   EXPECT_EQ(device.json("log list")["logs"][0]["place"], "withheld");
   fileLogs({"refused/StorageStatus-2"});
-  EXPECT_NE(device.run("status").out.find("Refused logs     1, refused by the server\n"),
-            std::string::npos);
+  expectIn(device.run("status").out, {"Refused logs     1, refused by the server\n"});
   EXPECT_EQ(device.json("log list")["logs"][1]["place"], "refused");
-  EXPECT_NE(
-      device.run("log show StorageStatus-2").out.find("refused/StorageStatus-2.log (refused)\n"),
-      std::string::npos);
+  expectIn(device.run("log show StorageStatus-2").out, {"refused/StorageStatus-2.log (refused)\n"});
   EXPECT_EQ(device.json("log show StorageStatus-1")["log"]["text"], "text");
 }
 
@@ -177,12 +164,7 @@ TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
   fs::permissions(device.path(""), fs::perms{0755});
   const std::string refused = device.path(kSubmission + "refused");
   fs::permissions(refused, fs::perms{0700});
-  const auto run = [this](const char* command) {
-    EXPECT_EQ(seteuid(65534), 0);
-    Outcome outcome = device.run(command);
-    EXPECT_EQ(seteuid(0), 0);
-    return outcome;
-  };
+  const auto run = [this](const char* command) { return device.runAsAnother(command); };
   const auto unlisted = [this](const char* place) {
     return "tavrelctl: cannot list " + device.path(kSubmission + place) +
            ": Permission denied; run as root or as the owner of the files";
@@ -197,7 +179,7 @@ TEST_F(Consent, ShowsOtherUsersTheLogsThatTheyMaySee) {
   for (const auto& [command, status, shown] : kCases) {
     const Outcome outcome = run(command);
     EXPECT_EQ(outcome.status, status) << outcome;
-    EXPECT_NE((outcome.out + outcome.error).find(shown), std::string::npos) << outcome;
+    expectIn(outcome.out + outcome.error, {shown});
     EXPECT_EQ(outcome.error.find(unseen) == 0, status != 0) << outcome;
   }
   fs::remove(device.path(kSubmission + "outbox/log-tallied-1.log"));

@@ -10,10 +10,12 @@
 #include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
+#include <unistd.h>
 #include <vector>
 
 #include "base/format.h"
 #include "platform/plist/xml.h"
+#include "tests/fakes/command_line.h"
 #include "tests/platform/temporary_root.h"
 #include "tools/shared/json_value.h"
 #include "tools/tavrelctl.h"
@@ -24,7 +26,14 @@ using namespace nlohmann::literals;
 
 inline constexpr const char* kWhitelistFile =
     "/Library/Application Support/Brimhold/Whitelist_Pellio.plist";
+inline const std::string kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
 inline const std::string kSubmission = "/var/mobile/Library/Logs/Submission/";
+
+/// Expects a text to have each of these parts.
+inline void expectIn(const std::string& text, std::initializer_list<std::string> parts) {
+  for (const std::string& part : parts)
+    EXPECT_NE(text.find(part), text.npos) << part << "\nis not in\n" << text.substr(0, 4000);
+}
 
 /// The number of the current day.
 inline std::int32_t today() {
@@ -61,24 +70,6 @@ inline Outcome fails(const std::string& error, int status = 1) {
   return {status, {}, "tavrelctl: " + error + "\n"};
 }
 
-/// The words of a command; may be given as one text if no word is empty or contains spaces.
-struct CommandLine : std::vector<std::string> {
-  CommandLine(std::initializer_list<std::string> words) : vector(words) {}
-  CommandLine(std::vector<std::string> words) : vector(std::move(words)) {}
-  CommandLine(const std::string& text) {
-    std::istringstream words(text);
-    for (std::string word; words >> word;)
-      push_back(word);
-  }
-  CommandLine(const char* text) : CommandLine(std::string(text)) {}
-
-  CommandLine with(const std::string& word) const {
-    CommandLine longer = *this;
-    longer.push_back(word);
-    return longer;
-  }
-};
-
 class TemporaryDevice : public TemporaryRoot {
  public:
   std::string path(std::string_view devicePath) const { return root.path(devicePath); }
@@ -96,6 +87,15 @@ class TemporaryDevice : public TemporaryRoot {
   Outcome run(const CommandLine& command, const std::string& input = {},
               std::optional<std::size_t> columns = std::nullopt) const {
     return runAt(path(""), command, input, columns);
+  }
+
+  /// Runs a command as a user who owns nothing here, if this user is root.
+  Outcome runAsAnother(const CommandLine& command) const {
+    const uid_t user = geteuid();
+    EXPECT_EQ(user == 0 ? seteuid(65534) : 0, 0);
+    const Outcome outcome = run(command);
+    EXPECT_EQ(seteuid(user), 0);
+    return outcome;
   }
 
   static Outcome runAt(const std::string& root, CommandLine command, const std::string& input = {},
@@ -123,12 +123,27 @@ class TemporaryDevice : public TemporaryRoot {
     return json;
   }
 
+  /// A reading of a drive's health; figures and `more` members of it are JSON.
+  void writeDrive(const std::string& name, const std::string& kind, const std::string& figures,
+                  const std::string& time = "2026-01-01T00:00:00Z",
+                  const std::string& more = "") const {
+    write("/run/tavrel/health/" + name + ".plist",
+          xmlOf(R"({"version": 1, "name": ")" + name + R"(", "kind": ")" + kind +
+                R"(", "time": {"$date": ")" + time + R"("}, )" + more + R"("figures": {)" +
+                figures + "}}"));
+  }
+
   /// Files a log with metadata in a submission folder ("pending/NAME").
   void fileLog(const std::string& name, std::string_view content,
                const std::string& metadata) const {
     write(kSubmission + name + ".log", content);
     write(kSubmission + name + ".metadata.plist", xmlOf(metadata));
   }
+};
+
+/// Tests with a device each. A suite without further helpers is an alias of this.
+struct DeviceTest : testing::Test {
+  const TemporaryDevice device{};
 };
 
 }  // namespace tavrel

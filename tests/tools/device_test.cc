@@ -11,8 +11,9 @@ namespace {
 
 using namespace std::chrono_literals;
 
-TEST(Send, SendsWhatTheServiceUnderstands) {
-  const TemporaryDevice device;
+using Send = DeviceTest;
+
+TEST_F(Send, SendsWhatTheServiceUnderstands) {
   device.check(
       "send announce",
       fails("cannot connect to " + device.path("/run/tavrel/com.norvane.tallied.tavrel.socket") +
@@ -53,9 +54,8 @@ TEST(Send, SendsWhatTheServiceUnderstands) {
   EXPECT_EQ(device.run("send force tomorrow").status, 2);
 }
 
-TEST(Send, ChecksApplicationsBeforeItSends) {
+TEST_F(Send, ChecksApplicationsBeforeItSends) {
   const std::string good = R"("bundle_id": "a", "version": "1", "orbo_id": 1, "arch": 1)";
-  const TemporaryDevice device;
   const std::vector<std::pair<std::string, std::string>> cases = {
       {"{}",
        "not an array of applications: give dictionaries with \"bundle_id\", \"version\" and "
@@ -70,8 +70,7 @@ TEST(Send, ChecksApplicationsBeforeItSends) {
     EXPECT_EQ(device.run("send deliver -", document), fails("standard input: " + reason));
 }
 
-TEST(Send, NotificationsArePostedAndAwaited) {
-  const TemporaryDevice device;
+TEST_F(Send, NotificationsArePostedAndAwaited) {
   device.check("notify wait org.example.n --timeout 0",
                fails("org.example.n was not posted within 0 seconds"));
   for (const std::string timeout : {"nan", "abc", "-1", "1x"}) {
@@ -89,11 +88,10 @@ TEST(Send, NotificationsArePostedAndAwaited) {
                        2));
 }
 
-struct TaskingTest : testing::Test {
+struct TaskingTest : DeviceTest {
   TaskingTest() {
     device.write("/etc/tavrel/system-version.plist", xmlOf(R"({"ProductBuildVersion": "B1"})"));
   }
-  TemporaryDevice device;
 };
 
 TEST_F(TaskingTest, SchedulesShowsAndClears) {

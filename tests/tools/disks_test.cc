@@ -9,10 +9,9 @@ TEST(DisksTest, ShowsReadingsAndWhatSysfsTells) {
   device.write("/proc/sys/kernel/random/boot_id", "b1\n");
   device.write("/sys/class/ubi/ubi0/max_ec", "9\n");
   device.write("/sys/class/ubi/ubi0/mtd_num", "0\n");
-  device.write("/run/tavrel/health/nvme0.plist", xmlOf(R"({"version": 1, "name": "nvme0",
-      "kind": "nvme", "model": "Disk", "firmware": "1", "capacity": 1048576, "boot": "b0",
-      "time": {"$date": "2000-01-01T00:00:00Z"}, "from": "log 02h", "growth": {"written": 5},
-      "figures": {"used_pct": 255, "written": 1024, "unheard_of": 1}})"));
+  device.writeDrive("nvme0", "nvme", R"("used_pct": 255, "written": 1024, "unheard_of": 1)",
+                    "2000-01-01T00:00:00Z", R"("model": "Disk", "firmware": "1",
+      "capacity": 1048576, "boot": "b0", "from": "log 02h", "growth": {"written": 5}, )");
   const auto json = device.json("disks --all", {}, 16 | 64);
   const auto nvme = json["disks"][0], ubi = json["disks"][1];
   EXPECT_EQ(nvme["figures"], (nlohmann::json{{"used_pct", 255}, {"written", 1024}}));
@@ -21,15 +20,13 @@ TEST(DisksTest, ShowsReadingsAndWhatSysfsTells) {
   EXPECT_EQ(nvme["sources"][2]["name"], "nvme0.written_growth");
   EXPECT_EQ(ubi["figures"], (nlohmann::json{{"erases_max", 9}}));
   EXPECT_EQ(ubi["age_seconds"], 0);
-  const Outcome text = device.run("disks");
-  EXPECT_NE(text.out.find("nvme0: read before the last start of the system\n"), text.out.npos);
-  EXPECT_NE(text.out.find(" 255 % "), text.out.npos);
+  expectIn(device.run("disks").out,
+           {"nvme0: read before the last start of the system\n", " 255 % "});
 
   device.write("/run/tavrel/health/nvme0.plist", "garbage");
   const Outcome broken = device.run("disks");
   EXPECT_EQ(broken.status, 1);
-  EXPECT_NE(broken.error.find("cannot use reading " + device.path("/run/tavrel/health/nvme0")),
-            broken.error.npos);
+  expectIn(broken.error, {"cannot use reading " + device.path("/run/tavrel/health/nvme0")});
 }
 
 }  // namespace

@@ -10,21 +10,28 @@
 namespace tavrel {
 namespace {
 
-TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
-  const TemporaryDevice device;
+// Another program records, whose values wait to be folded.
+void recordElsewhere(const TemporaryDevice& device, std::initializer_list<double> values = {}) {
+  std::filesystem::create_directories(device.path("/run/tavrel/stat"));
+  EXPECT_EQ(inChild([&] {
+              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
+              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
+              for (const double value : values)
+                BHClientDistributionRecord(BHClientDistributionForKey("app.t"), value);
+              return 0;
+            }),
+            0);
+}
+
+using StatFoldTest = DeviceTest;
+
+TEST_F(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   device.check("stat fold", prints("nothing to fold: the device has no folder /run/tavrel/stat\n"));
   device.run("stat import", "scalar\t2\tapp.old\t1\nvalue\t2\tapp.t\t5\t0.5\n");
   const std::filesystem::path folder = device.path("/run/tavrel/stat");
   std::filesystem::create_directories(folder);
   device.check("stat fold", prints("0 segments: 0 scalars, 0 values; 0 removed\n"));
-  EXPECT_EQ(inChild([&] {
-              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
-              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
-              for (const double value : {1.5, 2.5})
-                BHClientDistributionRecord(BHClientDistributionForKey("app.t"), value);
-              return 0;
-            }),
-            0);
+  recordElsewhere(device, {1.5, 2.5});
   std::ofstream(folder / "x.segment") << "no segment";
   device.write(kWhitelistFile, xmlOf(R"({"G": {
       "ScalarKeys": {"app.n": {}}, "DistributionKeys": {"app.t": {"intervals": [2]}}}})"));
@@ -44,28 +51,22 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
     return log.erase(std::min(log.find("<date>"), log.size()), sizeof "<date>2026-11-27T11:16:25Z");
   };
   const std::string log = preview();
-  for (const char* key : {"<key>app.n</key>", "<key>app.t</key>"})
-    EXPECT_NE(log.find(key), std::string::npos) << log;
+  expectIn(log, {"<key>app.n</key>", "<key>app.t</key>"});
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
-  const Outcome rehearsed = device.run("rehearse --today");
-  EXPECT_NE(rehearsed.out.find(format("reads scalars of day %d: 1 row\n", today())),
-            std::string::npos)
-      << rehearsed;
-  const std::string aside =
-      device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x");
-  device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb.corrupt-x", "");
+  expectIn(device.run("rehearse --today").out,
+           {format("reads scalars of day %d: 1 row\n", today())});
+  const std::string aside = device.path(kStore + ".corrupt-x");
+  device.write(kStore + ".corrupt-x", "");
   const Outcome part = device.run("log preview --day today");
   EXPECT_TRUE(part.status == 1 &&
               part.error.ends_with(": rows may be missing: they were in " + aside +
                                    ", which is damaged: inspect or remove that file\n"))
       << part;
-  EXPECT_NE(device.run("rehearse --today").out.find(" without statistics that could not be read"),
-            std::string::npos);
+  expectIn(device.run("rehearse --today").out, {" without statistics that could not be read"});
   std::filesystem::remove(aside);
 
-  EXPECT_NE(device.run("status --check")
-                .out.find("OK folding: 2 segments, 2 statistics with values that wait, for "),
-            std::string::npos);
+  expectIn(device.run("status --check").out,
+           {"OK folding: 2 segments, 2 statistics with values that wait, for "});
   const Outcome folded = device.run("stat fold");
   EXPECT_EQ(folded.out, "1 segment: 1 scalar, 2 values; 1 removed\nrefused: 0 values, 1 file\n");
   EXPECT_EQ(folded.error, "tavrelctl: \"x.segment\" in " + folder.string() +
@@ -80,40 +81,28 @@ TEST(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   EXPECT_EQ(device.json("stat fold"),
             R"({"format_version": 1, "segments": 0, "scalars": 0, "values": 0, "removed": 0,
                 "waiting": 0, "dropped": 0, "refused": 0, "segments_refused": 0})"_json);
-  EXPECT_NE(device.run("stat list").out.find("com.norvane.brimhold.segments_refused"),
-            std::string::npos);
+  expectIn(device.run("stat list").out, {"com.norvane.brimhold.segments_refused"});
   std::filesystem::remove_all(device.path("/var"));
   device.write("/var", "");
   const Outcome failed = device.run("stat fold");
   EXPECT_EQ(failed.status, 1);
   EXPECT_EQ(failed.out, "");
-  EXPECT_NE(failed.error.find("; what programs recorded waits for the next fold\n"),
-            std::string::npos)
-      << failed;
+  expectIn(failed.error, {"; what programs recorded waits for the next fold\n"});
 }
 
 // A closed store is not an empty one, and no line hides or repeats another.
-TEST(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
+TEST_F(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
   if (geteuid() != 0) GTEST_SKIP() << "only root can become another user";
-  const TemporaryDevice device;
   std::filesystem::permissions(device.path(""), std::filesystem::perms{0755});
-  std::filesystem::create_directories(device.path("/run/tavrel/stat"));
   device.run("stat import", "scalar\ttoday\tapp.n\t1\n");
-  EXPECT_EQ(inChild([&] {
-              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
-              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
-              return 0;
-            }),
-            0);
+  recordElsewhere(device);
   device.write(kWhitelistFile, xmlOf(R"({"G": {"ScalarKeys": {"app.n": {}}}})"));
   device.write("/etc/tavrel/recorders.plist", xmlOf(R"({"nosuchuser": ["app.x"]})"));
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");
-  const std::string store = device.path("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb");
+  const std::string store = device.path(kStore);
   std::filesystem::permissions(store, std::filesystem::perms{0600});
   const auto run = [&](const std::string& command) {
-    EXPECT_EQ(seteuid(65534), 0);
-    Outcome outcome = device.run(command);
-    EXPECT_EQ(seteuid(0), 0);
+    const Outcome outcome = device.runAsAnother(command);
     EXPECT_EQ(outcome.status, 1) << outcome;
     return outcome;
   };
@@ -133,8 +122,7 @@ TEST(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
   const Outcome rehearsed = run("rehearse --today");
   expectOnce(rehearsed, others);
   expectOnce(rehearsed, "the run would log 1 error; the first: ");
-  EXPECT_NE(rehearsed.out.find(": the statistics store could not be read; see "), std::string::npos)
-      << rehearsed;
+  expectIn(rehearsed.out, {": the statistics store could not be read; see "});
   expectOnce(run("page -o - --day today"), others);
 
   std::filesystem::permissions(store, std::filesystem::perms{0644});
@@ -143,29 +131,21 @@ TEST(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
 }
 
 // However few files may be open, everything is shown, or a line says what could not be read.
-TEST(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
-  const TemporaryDevice device;
+TEST_F(StatFoldTest, NothingIsLeftOutWhereNoFileCanBeOpened) {
   device.run("stat import", "scalar\t2\tapp.old\t1\n");
-  const std::filesystem::path folder = device.path("/run/tavrel/stat");
-  std::filesystem::create_directories(folder);
-  EXPECT_EQ(inChild([&] {
-              setenv("TAVREL_ROOT", device.path("").c_str(), 1);
-              BHClientScalarAdd(BHClientScalarForKey("app.n"), 3);
-              return 0;
-            }),
-            0);
+  recordElsewhere(device);
   const auto whole = device.run("stat list");
-  EXPECT_NE(whole.out.find("app.n"), std::string::npos) << whole;
-  const std::string store = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+  expectIn(whole.out, {"app.n"});
   // UBSan opens a pipe when it first sees an exception of some type.
-  device.write("/other" + store, "no database");
+  device.write("/other" + kStore, "no database");
   EXPECT_EQ(TemporaryDevice::runAt(device.path("/other"), "stat list").status, 1);
   const std::string tooMany = "Too many open files";
   const std::string advice = "; raise the number of files that a process may open (ulimit -n)";
-  const std::string stored = "tavrelctl: statistics store " + device.path(store) +
+  const std::string stored = "tavrelctl: statistics store " + device.path(kStore) +
                              ": unable to open database file (" + tooMany + "): ";
   const auto inFolder = [&](const char* failed) {
-    return fails(format("cannot %s %s: ", failed, folder.string()) + tooMany + advice);
+    return fails(format("cannot %s %s: ", failed, device.path("/run/tavrel/stat")) + tooMany +
+                 advice);
   };
   // The child has three files open; reading the store takes three more.
   const std::optional<Outcome> kWithMore[] = {inFolder("open"), {},    {},   {},

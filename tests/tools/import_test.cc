@@ -4,7 +4,6 @@
 #include <sched.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 
 #include "device.h"
 #include "tools/shared/tool_context.h"
@@ -16,8 +15,6 @@
 
 namespace tavrel {
 namespace {
-
-constexpr const char* kStore = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
 
 TEST(ExactDouble, ReadsWhatStrtodReadsAndWritesEveryBit) {
   using Case = std::tuple<const char*, std::uint64_t, const char*>;
@@ -47,7 +44,9 @@ TEST(ExactDouble, ReadsWhatStrtodReadsAndWritesEveryBit) {
   EXPECT_EQ(parseExactDouble("-1e309").error().message, "beyond the range of a double: -1e309");
 }
 
-TEST(StatImport, RefusesABadLineAndKeepsNothing) {
+using StatImport = DeviceTest;
+
+TEST_F(StatImport, RefusesABadLineAndKeepsNothing) {
   const std::string kScalar =
       "a scalar has four fields, separated by tabs: scalar, day, key, integer";
   const std::string kDay = ": give today, yesterday, a 32-bit day number or YYYY-MM-DD";
@@ -69,7 +68,6 @@ TEST(StatImport, RefusesABadLineAndKeepsNothing) {
       {"value\t1\tk\t86400\t1", "seconds within the day are 0 to 86399, not: 86400"},
       {"value\t1\tk\t1\tone", "not a number: one"},
       {std::string(3U << 20, 'x'), "a line has more than 1052672 bytes"}};
-  const TemporaryDevice device;
   device.check("stat set before 1", prints(""));
   const auto before = device.run("stat export");
   for (const auto& [line, reason] : cases) {
@@ -85,7 +83,7 @@ TEST(StatImport, RefusesABadLineAndKeepsNothing) {
   device.check("stat export", before);
 }
 
-TEST(StatImport, ExportGivesBackWhatWasImported) {
+TEST_F(StatImport, ExportGivesBackWhatWasImported) {
   std::string lines =
       "scalar\t-2147483648\tfirst\t-9223372036854775808\nscalar\t1\ta\t0\n"
       "scalar\t1\tk\xC3\xA9\t1\nscalar\t2147483647\t" +
@@ -93,7 +91,6 @@ TEST(StatImport, ExportGivesBackWhatWasImported) {
   for (int i = 0; i < 3000; ++i)
     lines += format("value\t1\td\t%d\t%d.25\n", i, i);
   lines += "value\t1\te\t86399\tnan(0x7ff0000000000001)\nvalue\t1\te\t0\t-0\nvalue\t2\td\t0\t-inf";
-  const TemporaryDevice device;
   device.check("stat import", prints("standard input: 4 scalars, 3003 values\n"), lines);
   device.check("stat export", prints(lines + "\n"));
   device.check("stat export d --day 1970-01-03", prints("value\t2\td\t0\t-inf\n"));
@@ -256,8 +253,9 @@ std::string exported(const TemporaryDevice& device, const std::string& options =
   return all;
 }
 
-TEST(StatCommands, SetAddAndRecordWriteToToday) {
-  const TemporaryDevice device;
+using StatCommands = DeviceTest;
+
+TEST_F(StatCommands, SetAddAndRecordWriteToToday) {
   device.check("stat export", prints(""));
   EXPECT_FALSE(std::filesystem::exists(device.path(kStore)));
   device.check("stat set k -5", prints(""));
@@ -286,238 +284,187 @@ TEST(StatCommands, SetAddAndRecordWriteToToday) {
   EXPECT_EQ(exported(device, "--day today"), "k=9223372036854775802 d=-1.5 d=0.5 d=-inf ");
 }
 
-// Waits two seconds between readings, and changes the machine in between.
-struct SlowPace final : CollectPace {
-  explicit SlowPace(std::function<void()> between) : change(std::move(between)) {}
-  Ticks now() override { return time; }
-  bool endsBefore(Ticks) override {
-    time += std::chrono::seconds(2);
-    change();
-    return false;
-  }
-
-  std::function<void()> change;
-  Ticks time;
-};
-
-// Waits as long as requested, and ends a run after some readings. The machine starts at midnight.
+// Waits as long as requested or somewhat longer, and ends a run after some readings. The machine
+// starts at midnight.
 struct PeriodicPace final : CollectPace {
   Ticks now() override { return time; }
   std::chrono::system_clock::time_point wallTime() override {
     return std::chrono::sys_days(std::chrono::days(20000)) + time.time_since_epoch();
   }
   bool endsBefore(Ticks end) override {
-    time = end;
+    time = end + late;
     between();
     return left-- == 0;
   }
 
-  std::function<void()> between;
+  std::function<void()> between = [] {};
   int left = 0;
+  std::chrono::seconds late{0};
   Ticks time{std::chrono::hours(1)};
 };
 
-std::string storeNote(const TemporaryDevice& device) {
-  return "tavrelctl: " + device.path("/run/tavrel/stat") +
-         ": samples go into the store, on flash, once an hour: no such folder; start "
-         "tavrel-folders.service\n";
-}
+// A device, and a sampler of it whose readings a test counts.
+struct SamplerTest : DeviceTest {
+  SamplerTest() { device.write("/proc/sys/kernel/random/boot_id", "boot-1\n"); }
 
-// What a sampler prints that ends after some readings.
-std::string sample(const TemporaryDevice& device, const std::string& state, PeriodicPace& pace) {
-  std::istringstream in;
-  std::ostringstream out, error;
-  ToolContext context({.in = in, .out = out, .error = error});
-  context.setRoot(device.path(""));
-  collectEvery(context, std::chrono::seconds(60), state, pace);
-  return out.str() + error.str() + (context.exitStatus() == 0 ? "" : "failed");
-}
+  // Ends another reading, before which 30 KiB were received.
+  void receive() {
+    ++readings;
+    device.write("/proc/net/dev", format("\n\neth0: %d 0 0 0 0 0 0 0 0 0\n", 30720 * readings));
+  }
+  // What a sampler prints that ends after some readings.
+  std::string sample(int count, const std::string& state = {}) {
+    pace.left = count;
+    return sample(pace, state);
+  }
+  std::string sample(PeriodicPace& paceOfSampler, const std::string& state = {}) const {
+    std::istringstream in;
+    std::ostringstream out, error;
+    ToolContext context({.in = in, .out = out, .error = error});
+    context.setRoot(device.path(""));
+    collectEvery(context, std::chrono::seconds(60), state, paceOfSampler);
+    return out.str() + error.str() + (context.exitStatus() == 0 ? "" : "failed");
+  }
 
-TEST(StatCommands, SamplesForTheStoreWaitUntilThereIsAFolder) {
-  const TemporaryDevice device;
+  const std::string storeNote =
+      "tavrelctl: " + device.path("/run/tavrel/stat") +
+      ": samples go into the store, on flash, once an hour: no such folder; start "
+      "tavrel-folders.service\n";
   PeriodicPace pace;
-  pace.left = 62;
+  int readings = 0;
+};
+
+TEST_F(SamplerTest, WaitsUntilThereIsAFolder) {
   pace.between = [&] {
     if (pace.left != 3 && pace.left != 2) return;
     const bool isKept = exported(device).find("usage.samples=60 ") != std::string::npos;
     EXPECT_EQ(isKept, pace.left == 2);
     if (pace.left == 2) std::filesystem::create_directories(device.path("/run/tavrel/stat"));
   };
-  EXPECT_EQ(sample(device, "", pace), storeNote(device) +
-                                          "tavrelctl: " + device.path("/run/tavrel/stat") +
-                                          " is there now: start again to record in memory\nfailed");
-  EXPECT_NE(exported(device).find("usage.samples=61 "), std::string::npos);
+  EXPECT_EQ(sample(62), storeNote + "tavrelctl: " + device.path("/run/tavrel/stat") +
+                            " is there now: start again to record in memory\nfailed");
+  expectIn(exported(device), {"usage.samples=61 "});
 }
 
-TEST(StatCommands, SamplesAreKeptWhenTheirStateIsOnAReadOnlyFileSystem) {
-  const TemporaryDevice device;
+TEST_F(SamplerTest, KeepsSamplesWhenTheirStateIsOnAReadOnlyFileSystem) {
   const std::string run = device.path("/run");
   std::filesystem::create_directories(run + "/tavrel");
   // A confined service sees what is made in /run after its start, but cannot write there.
-  const pid_t child = fork();
-  if (child == 0) {
+  const int status = inChild([&] {
     const char* const from = run.c_str();
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
         mount(from, from, nullptr, MS_BIND, nullptr) != 0 ||
         mount("none", from, nullptr, MS_BIND | MS_REMOUNT | MS_RDONLY, nullptr) != 0) {
-      _exit(77);
+      return 77;
     }
-    PeriodicPace pace;
-    pace.left = 2;
-    pace.between = [] {};
-    EXPECT_EQ(sample(device, "", pace),
-              storeNote(device) + "tavrelctl: cannot write " + run +
+    EXPECT_EQ(sample(2),
+              storeNote + "tavrelctl: cannot write " + run +
                   "/tavrel/collect.state: Read-only file system; make the file system writable; "
                   "the samples are kept, but the next process has no rates at first\n");
-    EXPECT_NE(exported(device).find("usage.samples=2 "), std::string::npos);
-    _exit(testing::Test::HasFailure() ? 1 : 0);
-  }
-  int status = 0;
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  if (WEXITSTATUS(status) == 77) GTEST_SKIP() << "may not mount";
+    expectIn(exported(device), {"usage.samples=2 "});
+    return HasFailure() ? 1 : 0;
+  });
+  if (status == 77) GTEST_SKIP() << "may not mount";
   EXPECT_EQ(status, 0);
 }
 
-TEST(StatCommands, SamplesThatWaitKeepOtherSamplersAway) {
-  const TemporaryDevice device;
-  device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
-  PeriodicPace pace;
-  pace.left = 3;
+TEST_F(SamplerTest, KeepsOtherSamplersAwayWhileSamplesWait) {
   const auto sampleElsewhere = [&] {
     PeriodicPace other;
     other.time = pace.time;
     other.left = 1;
-    other.between = [] {};
-    return sample(device, "", other);
+    return sample(other);
   };
-  int readings = 0;
   pace.between = [&] {
-    ++readings;  // 30 KiB each
-    device.write("/proc/net/dev", format("\n\neth0: %d 0 0 0 0 0 0 0 0 0\n", 30720 * readings));
+    receive();
     if (readings == 1) {
-      EXPECT_EQ(sampleElsewhere(), storeNote(device));
+      EXPECT_EQ(sampleElsewhere(), storeNote);
     }
     if (readings != 3) return;
     EXPECT_EQ(sampleElsewhere(),
-              storeNote(device) + "tavrelctl: cannot lock " +
+              storeNote + "tavrelctl: cannot lock " +
                   device.path("/run/tavrel/collect.state.lock") +
                   ": another process has had it locked for 2 seconds; it may be a sampler whose "
                   "samples wait for the store: stop it first\nfailed");
   };
-  EXPECT_EQ(sample(device, "", pace), storeNote(device));
-  EXPECT_EQ(sampleElsewhere(), storeNote(device));
-  const std::string all = exported(device);
-  for (const char* values : {"received_kib=90 ", "samples=5 "})
-    EXPECT_NE(all.find(values), std::string::npos) << values << all;
+  EXPECT_EQ(sample(3), storeNote);
+  EXPECT_EQ(sampleElsewhere(), storeNote);
+  expectIn(exported(device), {"received_kib=90 ", "samples=5 "});
 }
 
-TEST(StatCommands, SamplesGoOnWithoutTheirStateAndWithoutASensorThatBlocks) {
-  const TemporaryDevice device;
+TEST_F(SamplerTest, GoesOnWithoutItsStateAndWithoutASensorThatBlocks) {
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
   device.write("/sys/class/thermal/thermal_zone1/x", "");
   const std::string blocked = device.path("/sys/class/thermal/thermal_zone1/temp");
   ASSERT_EQ(mkfifo(blocked.c_str(), 0600), 0);
   device.write("/run/full", "");
-  PeriodicPace pace;
-  pace.left = 61;  // an hour, and one
-  pace.between = [] {};
   const std::string state = device.path("/run/full/state");
-  EXPECT_EQ(sample(device, state, pace),
-            storeNote(device) + "tavrelctl: " + blocked +
+  EXPECT_EQ(sample(61, state),  // an hour, and one
+            storeNote + "tavrelctl: " + blocked +
                 " does not answer within 1000 ms: left out until it does\n"
                 "tavrelctl: cannot write " +
                 state +
                 ": Not a directory; sampling goes on, but after a restart the first sample has no "
                 "rates\n");
-  const std::string all = exported(device);
-  for (const char* values :
-       {"usage.samples=61 ", "celsius=41.5 com.norvane.usage.temperature.celsius=41.5 "})
-    EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
+  expectIn(exported(device),
+           {"usage.samples=61 ", "celsius=41.5 com.norvane.usage.temperature.celsius=41.5 "});
 }
 
-TEST(StatCommands, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
-  const TemporaryDevice device;
-  device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
-  const std::filesystem::path state = device.path("/run/tavrel/collect.state");
-  PeriodicPace pace;
-  int received = 0;  // KiB; 30 more before each reading
-  pace.between = [&] {
-    device.write("/proc/net/dev",
-                 "\n\neth0: " + std::to_string(1024 * (received += 30)) + " 0 0 0 0 0 0 0 0 0\n");
-  };
-  std::istringstream in;
-  std::ostringstream out, error;
-  for (const int readings : {2, 2}) {
-    ToolContext context({.in = in, .out = out, .error = error});
-    context.setRoot(device.path(""));
-    pace.left = readings;
-    collectEvery(context, std::chrono::seconds(60), "", pace);
-    EXPECT_TRUE(std::filesystem::exists(state));
+TEST_F(SamplerTest, CollectsInEachPeriodAndGoesOnAfterAnEnd) {
+  pace.between = [&] { receive(); };
+  for (int run = 0; run < 2; ++run) {
+    EXPECT_EQ(sample(2), storeNote);
+    EXPECT_TRUE(std::filesystem::exists(device.path("/run/tavrel/collect.state")));
   }
-  EXPECT_EQ(out.str() + error.str(), storeNote(device) + storeNote(device));
-  const std::string all = exported(device);
   // The second run counts what happened between the last reading of the first run and its own.
-  for (const char* values : {"usage.network.received_kib=120 ", "usage.samples=4 ",
-                             "received_kib_per_second=0.5 ", "received_kib_per_second=1 "})
-    EXPECT_NE(all.find(values), std::string::npos) << values << "in " << all;
+  expectIn(exported(device), {"usage.network.received_kib=120 ", "usage.samples=4 ",
+                              "received_kib_per_second=0.5 ", "received_kib_per_second=1 "});
 }
 
-TEST(StatCommands, SamplesDoNotWaitIntoTheNextDay) {
-  const TemporaryDevice device;
-  PeriodicPace pace;
+TEST_F(SamplerTest, DoesNotKeepSamplesWaitingIntoTheNextDay) {
   pace.time = PeriodicPace::Ticks(std::chrono::minutes(24 * 60 - 2));
-  pace.left = 3;
   std::string kept;
   pace.between = [&] {
     kept += std::to_string(exported(device).find("usage.samples=2 ") != std::string::npos);
   };
-  EXPECT_EQ(sample(device, "", pace), storeNote(device));
+  EXPECT_EQ(sample(3), storeNote);
   EXPECT_EQ(kept, "0011") << "the sample of 23:59, before that of 24:00";
 }
 
-TEST(StatCommands, SamplesWaitForAStoreThatCannotBeWritten) {
-  for (const bool recovers : {true, false}) {
-    const TemporaryDevice device;
-    device.write("/proc/sys/kernel/random/boot_id", "boot-1\n");
-    const std::string store = device.path("/var/mobile/Library/Brimhold");
-    const auto mendStore = [&] {
-      std::filesystem::remove(store);
-      std::filesystem::rename(store + "-x", store);
-    };
-    PeriodicPace pace;
-    int readings = 0;
-    pace.between = [&] {
-      ++readings;  // 30 KiB each
-      device.write("/proc/net/dev", format("\n\neth0: %d 0 0 0 0 0 0 0 0 0\n", 30720 * readings));
-      if (readings == 62 && recovers) mendStore();
-    };
-    const auto sampleTimes = [&](int count) {
-      pace.left = count;
-      return sample(device, "", pace);
-    };
-    EXPECT_EQ(sampleTimes(1), storeNote(device));
-    readings = 1;
-    std::filesystem::rename(store, store + "-x");
-    std::ofstream(store) << "";
-    const std::string why =
-        "tavrelctl: statistics store " + device.path(kStore) +
-        ": its folder cannot be made: Not a directory: check owner and permissions of " +
-        device.path("/var/mobile/Library");
-    EXPECT_EQ(sampleTimes(recovers ? 62 : 200),
-              storeNote(device) + why + "; the samples wait, and the next one tries again\n" +
-                  (recovers ? "" : why + "\nfailed"));
-    EXPECT_EQ(readings, recovers ? 64 : 122) << "gives up after two hours";
-    if (!recovers) {
-      mendStore();
-      EXPECT_EQ(sampleTimes(1), storeNote(device));
-    }
-    // A process that gives up leaves its sums to the next one.
-    const std::string all = exported(device);
-    for (const std::string& value : {format("received_kib=%d ", 30 * (readings - 2)),
-                                     format("samples=%d ", recovers ? 63 : 2)})
-      EXPECT_NE(all.find(value), std::string::npos) << value << all;
+struct SamplerWithoutStore : SamplerTest, testing::WithParamInterface<bool> {};
+INSTANTIATE_TEST_SUITE_P(, SamplerWithoutStore, testing::Bool());
+
+TEST_P(SamplerWithoutStore, WaitsUntilItCanBeWrittenForTwoHours) {
+  const bool recovers = GetParam();
+  const std::string store = device.path("/var/mobile/Library/Brimhold");
+  const auto mendStore = [&] {
+    std::filesystem::remove(store);
+    std::filesystem::rename(store + "-x", store);
+  };
+  pace.between = [&] {
+    receive();
+    if (readings == 62 && recovers) mendStore();
+  };
+  EXPECT_EQ(sample(1), storeNote);
+  readings = 1;
+  std::filesystem::rename(store, store + "-x");
+  std::ofstream(store) << "";
+  const std::string why =
+      "tavrelctl: statistics store " + device.path(kStore) +
+      ": its folder cannot be made: Not a directory: check owner and permissions of " +
+      device.path("/var/mobile/Library");
+  EXPECT_EQ(sample(recovers ? 62 : 200), storeNote + why +
+                                             "; the samples wait, and the next one tries again\n" +
+                                             (recovers ? "" : why + "\nfailed"));
+  EXPECT_EQ(readings, recovers ? 64 : 122) << "gives up after two hours";
+  if (!recovers) {
+    mendStore();
+    EXPECT_EQ(sample(1), storeNote);
   }
+  // A process that gives up leaves its sums to the next one.
+  expectIn(exported(device), {format("received_kib=%d ", 30 * (readings - 2)),
+                              format("samples=%d ", recovers ? 63 : 2)});
 }
 
 TEST(CollectState, IsOfThisStartAndNoOlderThanADay) {
@@ -532,8 +479,7 @@ TEST(CollectState, IsOfThisStartAndNoOlderThanADay) {
     EXPECT_EQ(readCollectState(path, boot, now)->has_value(), isUsable) << boot << now.count();
 }
 
-TEST(StatCommands, CollectsWhatTheMachineTells) {
-  const TemporaryDevice device;
+TEST_F(SamplerTest, CollectsWhatTheMachineTells) {
   device.write("/proc/uptime", "1234.56 99.00\n");
   device.write("/proc/loadavg", "0.25 0.10 0.05 1/100 4242\n");
   device.write("/proc/stat",
@@ -551,7 +497,9 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
   std::filesystem::create_symlink("nvme-subsys0", device.path("/sys/block/nvme0n1/device"));
   device.write("/sys/class/thermal/thermal_zone0/temp", "41500\n");
   device.write("/sys/class/thermal/thermal_zone1/temp", "30000\n");
-  SlowPace pace([&] {
+  pace.late = std::chrono::seconds(1);
+  pace.left = 1;
+  pace.between = [&] {
     // 100 ticks, 30 of them idle and 10 waiting; 3 and 5 KiB on the network, 7 and 9 on the disk.
     device.write("/proc/stat", "cpu  30 40 50 430 60 6 7 8 0 0\ncpu0 1\ncpu1 9\nintr 1\n");
     device.write("/proc/net/dev",
@@ -560,7 +508,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
     device.write("/proc/diskstats",
                  "8 0 cciss/sda 1 1 214 1 1 1 418 1\n7 0 loop0 1 1 99 1 1 1 99 1\n"
                  "259 0 nvme0n1 1 1 99 1 1 1 99 1\n");
-  });
+  };
   std::istringstream in;
   std::ostringstream out, error;
   {
@@ -587,8 +535,7 @@ TEST(StatCommands, CollectsWhatTheMachineTells) {
             "temperature.celsius=41.5 temperature.celsius=41.5 ");
 }
 
-TEST(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {
-  const TemporaryDevice device;
+TEST_F(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {
   sigset_t term, before;
   sigemptyset(&term);
   sigaddset(&term, SIGTERM);

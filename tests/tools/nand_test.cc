@@ -42,8 +42,9 @@ constexpr const char* kStatistics = R"([
     ["readCountHisto", [8, 4, 2, 0, 0]], ["gcWrites", 7],
     ["bandsMaxTempHisto0", 0], ["bandsMaxTempHisto1", 0], ["bandsMaxTempHisto2", 0]])";
 
-TEST(NandInfo, GroupsWhatTheDriverAnswers) {
-  const TemporaryDevice device;
+using NandInfo = DeviceTest;
+
+TEST_F(NandInfo, GroupsWhatTheDriverAnswers) {
   record(device, built(device, kStatistics));
   device.check("nand info", prints(R"(Device
   ExportVersion  131075  0x20003
@@ -77,7 +78,7 @@ ReadsBeforeErasure
 
   const Outcome all = device.run("nand info --all");
   EXPECT_EQ(std::count(all.out.begin(), all.out.end(), '\n'), 42) << all;
-  EXPECT_NE(all.out.find("\nBandsMaxTempHisto: 3 buckets, all 0\n"), std::string::npos) << all;
+  expectIn(all.out, {"\nBandsMaxTempHisto: 3 buckets, all 0\n"});
 
   const auto json = device.json("nand info");
   EXPECT_EQ(json.size(), 34U) << json;
@@ -97,8 +98,7 @@ ReadsBeforeErasure
   EXPECT_EQ(device.json("nand info")["derived"]["free_virtual_blocks_share"], 0);
 }
 
-TEST(NandInfo, AFailureIsNoZero) {
-  const TemporaryDevice device;
+TEST_F(NandInfo, AFailureIsNoZero) {
   device.check("nand info",
                fails("Could not get matching Kernkit service for exporting classes\ntavrelctl: no "
                      "NAND information: Unable to parse buffer: put a recording of the storage "
@@ -113,8 +113,9 @@ TEST(NandInfo, AFailureIsNoZero) {
                 "com.norvane.NANDInfo.ErrorMessage": "Unsupported export version"})"_json);
 }
 
-TEST(NandParse, ReadsBackWhatWasBuilt) {
-  const TemporaryDevice device;
+using NandParse = DeviceTest;
+
+TEST_F(NandParse, ReadsBackWhatWasBuilt) {
   const std::string first = built(device, R"([["exportVersion", 4295098371], ["hostWrites", 1],
       ["hostWrites", 18446744073709551615], ["readCountHisto", [1, 2, 3]], ["ECBins", [9]],
       [21, [5, 5, 5]], ["TempSensorMax", []]])");
@@ -147,8 +148,7 @@ ECBins                              9
       {"key": "TempSensorMax", "values": []}, {"hex": "ab"}]})"_json);
 }
 
-TEST(NandParse, SaysWhereABufferIsBroken) {
-  const TemporaryDevice device;
+TEST_F(NandParse, SaysWhereABufferIsBroken) {
   const auto parse = [&](const std::string& entries, std::size_t recorded,
                          const std::string& error) {
     const std::string buffer = built(device, entries);
@@ -177,8 +177,7 @@ TEST(NandParse, SaysWhereABufferIsBroken) {
                "skipped\n"}));
 }
 
-TEST(NandParse, DifferencesPairEqualNamesInTheirOrder) {
-  const TemporaryDevice device;
+TEST_F(NandParse, DifferencesPairEqualNamesInTheirOrder) {
   device.write("/a", built(device, R"([["hostWrites", 1], ["boots", 5], ["hostWrites", 2],
       ["hostReads", 9], ["ECBins", [1, 2]], ["shutdowns", 0]])"));
   device.write("/b", built(device, R"([["hostReads", 4], ["hostWrites", 1], ["numSleepOps", 3],
@@ -253,13 +252,11 @@ TEST(NandCounters, ParserIsThatOfChipAndMaker) {
                      "tavrelctl: unrecognized hex character: \\x01\n"),
             "parseCounters1y 256");
   const Outcome text = device.run("nand counters - --chip-id K4V --manufacturer-id 0", block);
-  for (const char* part :
-       {"Parser  parseCountersAlgoGenericK4\n\nreadStage (33)\n   0:    0    1    2    3",
-        "\n  32:  110\n", "\nalgoNANDAccessesBin (8): all 0\n",
-        "\nreadStage10NumOfErrorsBin (10)\n  0  55  #################################",
-        "\nretentionIndication (12)\n  0:  0  0  75  76"}) {
-    EXPECT_NE(text.out.find(part), std::string::npos) << part << text;
-  }
+  expectIn(text.out,
+           {"Parser  parseCountersAlgoGenericK4\n\nreadStage (33)\n   0:    0    1    2    3",
+            "\n  32:  110\n", "\nalgoNANDAccessesBin (8): all 0\n",
+            "\nreadStage10NumOfErrorsBin (10)\n  0  55  #################################",
+            "\nretentionIndication (12)\n  0:  0  0  75  76"});
   EXPECT_EQ(device.run("nand counters - --chip-id K4V --manufacturer-id 0", block + "x"),
             fails("standard input is not a counter block: it has 4097 bytes, and a block has 4096: "
                   "cut one out with dd bs=4096 count=1 skip=CHANNEL"));

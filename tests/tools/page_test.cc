@@ -12,9 +12,7 @@ std::ptrdiff_t countOf(const std::string& text, const std::string& expression) {
   return std::distance(std::sregex_iterator(text.begin(), text.end(), pattern), {});
 }
 
-struct PageTest : testing::Test {
-  const TemporaryDevice device{};
-
+struct PageTest : DeviceTest {
   void import(const std::string& lines) const {
     ASSERT_EQ(device.run("stat import -", lines).status, 0);
   }
@@ -30,28 +28,14 @@ struct PageTest : testing::Test {
     return std::regex_replace(std::regex_replace(body, std::regex("<wbr>"), ""),
                               std::regex("(<[^>]*>|\\s)+"), " ");
   }
-
-  void expect(const std::string& text, std::initializer_list<std::string> parts) const {
-    for (const std::string& part : parts)
-      EXPECT_NE(text.find(part), text.npos) << part << "\n" << text.substr(0, 4000);
-  }
-
-  void writeDrive(const std::string& name, const std::string& kind,
-                  const std::string& figures) const {
-    device.write(
-        "/run/tavrel/health/" + name + ".plist",
-        xmlOf(R"({"version": 1, "name": ")" + name + R"(", "kind": ")" + kind +
-              R"(", "time": {"$date": "2026-01-01T00:00:00Z"}, "growth": {}, "figures": {)" +
-              figures + "}}"));
-  }
 };
 
 TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
   const std::string yesterday = dayDateText(today() - 1);
-  expect(textOf(), {"Device on " + yesterday, "Logs may leave the device Not allowed",
-                    "Logs that wait All empty", "recorded no scalar on " + yesterday,
-                    "recorded nothing on these days", "No driver of this device reports",
-                    "No drive of this device reports"});
+  expectIn(textOf(), {"Device on " + yesterday, "Logs may leave the device Not allowed",
+                      "Logs that wait All empty", "recorded no scalar on " + yesterday,
+                      "recorded nothing on these days", "No driver of this device reports",
+                      "No drive of this device reports"});
   EXPECT_EQ(device.run("page -o -").error,
             "tavrelctl: cannot read " + device.path(kWhitelistFile) +
                 ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
@@ -64,13 +48,13 @@ TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
   const std::pair<int, int> kDays[] = {{100, 100}, {0, 0}, {3, 3}, {1, 1}};
   for (const auto& [recorded, shown] : kDays) {
     import("scalar\t" + std::to_string(today() - recorded) + "\tk\t1\n");
-    expect(textOf(), {"Device on " + dayDateText(today() - shown), "k 1 not in it"});
+    expectIn(textOf(), {"Device on " + dayDateText(today() - shown), "k 1 not in it"});
   }
   device.write("/proc/uptime", "5\n");
   for (const char* line : {"0/name POLL", "0/time 25", "1/name C1", "1/time 75"})
     device.write("/sys/devices/system/cpu/cpu0/cpuidle/state" + std::string(line, 6), line + 7);
-  expect(textOf("--day 20000 --days 400"),
-         {"Device on 2024-10-04", "Trends over 400 days", "POLL 25.0 % 25 µs C1 75.0 % 75 µs"});
+  expectIn(textOf("--day 20000 --days 400"),
+           {"Device on 2024-10-04", "Trends over 400 days", "POLL 25.0 % 25 µs C1 75.0 % 75 µs"});
 }
 
 TEST_F(PageTest, TellsWhatLeaves) {
@@ -78,18 +62,19 @@ TEST_F(PageTest, TellsWhatLeaves) {
       "scalar\tyesterday\tcom.example.s\t1234\nscalar\tyesterday\tcom.example.t\t5\n"
       "value\tyesterday\tcom.example.d\t1\t3\nvalue\tyesterday\tcom.example.d\t2\tinf\n"
       "value\tyesterday\tcom.example.d\t3\tnan\n");
-  expect(textOf(), {"2 scalars. None leaves the device, because there is no log of this day: "});
+  expectIn(textOf(), {"2 scalars. None leaves the device, because there is no log of this day: "});
   device.write(kWhitelistFile, xmlOf(R"({"Usage": {
       "ScalarKeys": {"com.example.s": {"sig_fig": 1}},
       "DistributionKeys": {"com.example.d": {"intervals": [2, 4]}}}})"));
-  expect(textOf(), {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
-                    "has not allowed it",
-                    "com.example.s 1234 1000 com.example.t 5 not in it",
-                    "Values 3 Range 3 to inf Median 3 Mean inf",
-                    "and how many values are in (2, 4] 1 (4, inf) 2"});
+  expectIn(textOf(),
+           {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
+            "has not allowed it",
+            "com.example.s 1234 1000 com.example.t 5 not in it",
+            "Values 3 Range 3 to inf Median 3 Mean inf",
+            "and how many values are in (2, 4] 1 (4, inf) 2"});
   ASSERT_EQ(device.run("allow --from yesterday").status, 0);
-  expect(textOf(), {"The owner lets that log leave the device",
-                    "Logs may leave the device From " + dayDateText(today() - 1) + " on"});
+  expectIn(textOf(), {"The owner lets that log leave the device",
+                      "Logs may leave the device From " + dayDateText(today() - 1) + " on"});
 }
 
 TEST_F(PageTest, SaysWhatItLeavesOut) {
@@ -103,8 +88,8 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
   EXPECT_LT(size.size(), 2'000'000U);
   const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
   const std::string text = textOf("--days 400");
-  expect(text, {"Not shown for lack of space: 50 distributions; " + day + " has them all",
-                "1330 statistics more without a chart"});
+  expectIn(text, {"Not shown for lack of space: 50 distributions; " + day + " has them all",
+                  "1330 statistics more without a chart"});
   EXPECT_EQ(countOf(text, "lack of space: (\\d+) (scalars|statistics);"), 2);
 }
 
@@ -119,25 +104,25 @@ TEST_F(PageTest, EstimatesHowLongDrivesLast) {
     rows +=
         format("scalar\t%d\tcom.norvane.ioreport.%s.used_pct\t%d\n", today() - ago, drive, percent);
   import(rows);
-  writeDrive("nvme0", "nvme", R"("used_pct": 10, "power_on_hours": 2400)");
-  writeDrive("nvme1", "nvme", R"("used_pct": 100)");
-  writeDrive("nvme2", "nvme", R"("used_pct": 0, "power_on_hours": 9)");
-  writeDrive("nvme3", "nvme", R"("used_pct": 50, "power_on_hours": 9)");
-  writeDrive("nvme4", "nvme", R"("used_pct": 60, "power_on_hours": 2304)");
-  writeDrive("nvme5", "nvme", R"("used_pct": 24, "power_on_hours": 720)");
-  writeDrive("nvme6", "nvme", R"("used_pct": 3, "power_on_hours": 720)");
-  writeDrive("nvme7", "nvme", R"("used_pct": 3)");
-  writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
-  writeDrive("sda", "ata", R"("smart_good": 0)");
-  expect(textOf(), {"About 2.5 years of operation at the pace of its life so far",
-                    "Its rated life is used up", "Not known yet: no wear so far",
-                    "About 50 days at the pace of the days on this page",
-                    "About 64 days of operation at the pace of its life so far",
-                    "About 31 days at the pace of the days on this page",
-                    "About 2.7 years of operation at the pace of its life so far",
-                    "Not known yet: it has replaced another drive on these days",
-                    "Not known yet: its wear has not changed on these days",
-                    "Not known: the drive reports no wear", "failing, SMART status is failing"});
+  device.writeDrive("nvme0", "nvme", R"("used_pct": 10, "power_on_hours": 2400)");
+  device.writeDrive("nvme1", "nvme", R"("used_pct": 100)");
+  device.writeDrive("nvme2", "nvme", R"("used_pct": 0, "power_on_hours": 9)");
+  device.writeDrive("nvme3", "nvme", R"("used_pct": 50, "power_on_hours": 9)");
+  device.writeDrive("nvme4", "nvme", R"("used_pct": 60, "power_on_hours": 2304)");
+  device.writeDrive("nvme5", "nvme", R"("used_pct": 24, "power_on_hours": 720)");
+  device.writeDrive("nvme6", "nvme", R"("used_pct": 3, "power_on_hours": 720)");
+  device.writeDrive("nvme7", "nvme", R"("used_pct": 3)");
+  device.writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
+  device.writeDrive("sda", "ata", R"("smart_good": 0)");
+  expectIn(textOf(), {"About 2.5 years of operation at the pace of its life so far",
+                      "Its rated life is used up", "Not known yet: no wear so far",
+                      "About 50 days at the pace of the days on this page",
+                      "About 64 days of operation at the pace of its life so far",
+                      "About 31 days at the pace of the days on this page",
+                      "About 2.7 years of operation at the pace of its life so far",
+                      "Not known yet: it has replaced another drive on these days",
+                      "Not known yet: its wear has not changed on these days",
+                      "Not known: the drive reports no wear", "failing, SMART status is failing"});
 }
 
 TEST_F(PageTest, RefusesWhatItCannotDo) {
@@ -150,9 +135,9 @@ TEST_F(PageTest, RefusesWhatItCannotDo) {
   const std::string nowhere = device.path("/nowhere/x.html");
   const Outcome outcome = device.run("page -o " + nowhere);
   EXPECT_EQ(outcome.status, 1);
-  expect(outcome.error, {"cannot write " + nowhere});
-  device.write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb", "no database");
-  expect(textOf("", 1), {"Something is missing: ", "Critical"});
+  expectIn(outcome.error, {"cannot write " + nowhere});
+  device.write(kStore, "no database");
+  expectIn(textOf("", 1), {"Something is missing: ", "Critical"});
 }
 
 }  // namespace

@@ -164,15 +164,13 @@ TEST(Rehearse, TellsEveryStepAndChangesNothing) {
   EXPECT_EQ(device.files(), before);
 
   const std::string verbose = device.text(" --today -v");
-  for (const char* line : {"\n    |     <key>app.starts</key>\n", "\n    | Hardware Model: Board\n",
-                           "\n  would file record of type 176: {\"Factory Count\": 7}\n"}) {
-    EXPECT_NE(verbose.find(line), std::string::npos) << line << verbose;
-  }
+  expectIn(verbose, {"\n    |     <key>app.starts</key>\n", "\n    | Hardware Model: Board\n",
+                     "\n  would file record of type 176: {\"Factory Count\": 7}\n"});
 }
 
 TEST(Rehearse, GatedRunStopsWhereItsDayIsDone) {
   const Rehearsed device;
-  EXPECT_NE(device.text("").find(R"(
+  expectIn(device.text(""), {R"(
 Roll-over of the support log
   would roll nothing: the support log is empty or missing
 
@@ -183,8 +181,7 @@ End of the gated run
   would set preference com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 = YESTERDAY
   would write preferences of com.norvane.tallied.tavrel
 
-In total it would write: 4 preferences,)"),
-            std::string::npos);
+In total it would write: 4 preferences,)"});
   device.run("prefs set com.norvane.tallied.tavrel LastCrashLogSerializationDateInDaysSince1970 " +
              device.today["day"].dump() + " --int");
   EXPECT_EQ(device.text(""),
@@ -229,7 +226,7 @@ TEST(Rehearse, CountsTheLogsThatAWithdrawalLeftBehind) {
   const std::string line = "\n  would remove logs that wait without permission: 2\n";
   EXPECT_EQ(device.text(" --today").find(line), std::string::npos);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled false --bool");
-  EXPECT_NE(device.text(" --today").find(line), std::string::npos);
+  expectIn(device.text(" --today"), {line});
 }
 
 }  // namespace

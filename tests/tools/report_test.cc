@@ -15,15 +15,13 @@ std::string example() {
   return contentOf(TAVREL_EXAMPLES "/registry/report.plist");
 }
 
-struct ReportTest : testing::Test {
+struct ReportTest : DeviceTest {
   ReportTest() { device.write(kRecording, example()); }
 
   Dictionary recording() const { return plist::read(asBytes(example()))->dictionary(); }
   void play(const Dictionary& recording) {
     device.write(kRecording, *plist::writeBinary(recording));
   }
-
-  TemporaryDevice device;
 };
 
 TEST_F(ReportTest, ListsChannelsAsTreeAndTable) {
