@@ -247,6 +247,7 @@ TEST_F(StoreTest, ADamagedStoreLeavesDaysIncomplete) {
   const std::tuple<std::string, std::int64_t, std::int64_t> cases[] = {
       {"20261125T235959Z", kToday, kToday - 2},  // somebody has inspected it
       {"20261127T000000Z.1", kToday - 9, kToday},
+      {"20261127T000000Z", kToday + 365, kToday},  // the clock was ahead at the last change
       {kUnset, 0, kNone},
       {kUnset, kToday - 1, kToday - 1},  // the clock was not set yet
       {"20991231T000000Z", kToday - 3, kToday - 3},

@@ -155,11 +155,12 @@ StoreLoss StoreSite::lastLoss() const {
     };
     std::optional<std::int64_t> day = dayInStamp(std::string_view(name).substr(beginning.size()));
     // When the clock was wrong then, the last change tells more. Setting it aside sets the ctime,
-    // which is before the last change only if the clock was behind; inspecting or copying the file
-    // changes both.
-    const auto status = FileSystem::status(file);
-    if (status && (!isPlausible(day) || status->st_ctim.tv_sec < status->st_mtim.tv_sec)) {
-      day = dayOfSecond(status->st_mtim.tv_sec);
+    // which is before the last change only if the clock was behind, or ahead at that change;
+    // inspecting or copying the file changes both.
+    if (const auto status = FileSystem::status(file)) {
+      const std::int64_t changed = dayOfSecond(status->st_mtim.tv_sec);
+      const bool wasBehind = status->st_ctim.tv_sec < status->st_mtim.tv_sec && changed <= today;
+      if (!isPlausible(day) || (wasBehind && changed > *day)) day = changed;
     }
     if (isPlausible(day) && *day >= last.lastDay) last = {*day, lossOf(file)};
   }

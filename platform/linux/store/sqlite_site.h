@@ -98,7 +98,8 @@ struct StoreSite {
 
   /// What the latest of the stores took that were set aside, by any process, and are still there.
   /// It had rows of days up to when it was set aside or, when the clock was clearly wrong then, up
-  /// to its last change. When they cannot be listed, rows of any day may be missing.
+  /// to its last change, unless that is after today. When they cannot be listed, rows of any day
+  /// may be missing.
   StoreLoss lastLoss() const;
 };
 
