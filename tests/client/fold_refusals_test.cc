@@ -97,10 +97,28 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   std::filesystem::remove(file);
   std::ofstream(file) << R"(<plist version="1.0"><dict><key>proxy</key><array>
 <string>com.a.</string></array></dict></plist>)";
+  const auto live = [](uid_t user) {
+    const pid_t child = start([=] {
+      ASSERT_EQ(setuid(user), 0);
+      BHClientScalarAdd(BHClientScalarForKey("com.a.early"), 2);
+      raise(SIGSTOP);
+    });
+    waitpid(child, nullptr, WUNTRACED);
+    return child;
+  };
+  const pid_t children[] = {live(0), live(13)};
+  EXPECT_EQ(foldNow().scalars, 2U);
+  openStoreForWriting(store(), std::make_shared<BusyBudget>(1000))
+      .execute("UPDATE segments SET position = x'63000000' WHERE owner = 0");  // keeps it waiting
   lookUpResult = ENFILE;
   run([] { add(1); });
   FoldReport unknown = foldNow();
   EXPECT_EQ(unknown.failure.value_or("") + std::to_string(unknown.scalars), "1");
+  EXPECT_EQ(unknown.waiting, 1U);
+  for (const pid_t child : children) {
+    kill(child, SIGKILL);
+    waitFor(child);
+  }
   run([] {
     ASSERT_EQ(setuid(13), 0);
     BHClientScalarAdd(BHClientScalarForKey("com.a.late"), 2);
@@ -109,9 +127,12 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
     LinuxPlatform device(DeviceRoot(root), {.log = &log});
     const Recorders unsure =
         Recorders::read(device.root(), device.fileSystem(), device.platform().propertyLists, log);
-    const auto shown = RecordedHistory::open(device.root(), device.store(), unsure, {});
+    const auto shown = RecordedHistory::open(device.root(), device.store(), unsure,
+                                             {.key = "", .lastDay = INT32_MAX});
     EXPECT_EQ(shown->missingValues(),
-              Lines{"1 segment with values that wait is not shown: run 'tavrelctl stat fold'"});
+              (Lines{"1 segment with values that wait is not shown: run 'tavrelctl stat fold'",
+                     "1 segment with values that wait is not shown: try again when the users in " +
+                         file.string() + " can be looked up"}));
   }
   unknown = foldNow();
   EXPECT_EQ(unknown.failure,

@@ -1,11 +1,21 @@
 // What programs record, as the tool shows and folds it.
+#include <dlfcn.h>
 #include <optional>
+#include <pwd.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
 #include "brimhold/client.h"
 #include "device.h"
 #include "tools/shared/day_argument.h"
+
+extern "C" int getpwnam_r(const char* name, passwd* entry, char* text, size_t size,
+                          passwd** found) {
+  static const auto real = reinterpret_cast<decltype(&getpwnam_r)>(dlsym(RTLD_NEXT, "getpwnam_r"));
+  if (name != std::string("unreachable")) return real(name, entry, text, size, found);
+  *found = nullptr;
+  return EIO;
+}
 
 namespace tavrel {
 namespace {
@@ -128,6 +138,15 @@ TEST_F(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
   std::filesystem::permissions(store, std::filesystem::perms{0644});
   const std::string part = run("log preview --day today -v").error;
   EXPECT_TRUE(part.ends_with(others)) << part;
+
+  device.write("/etc/tavrel/recorders.plist", xmlOf(R"({"unreachable": ["app.x"]})"));
+  device.write("/run/tavrel/fold.lock", "");
+  for (const auto& segment : std::filesystem::directory_iterator(device.path("/run/tavrel/stat")))
+    EXPECT_EQ(chown(segment.path().c_str(), 13, 13), 0);
+  const std::string checks = device.run("status --check").out;
+  for (const char* text : {"WARNING folding: 1 segment, no fold took values for ",
+                           "; 1 segment with values that cannot be folded now; "})
+    EXPECT_NE(checks.find(text), std::string::npos) << checks;
 }
 
 // However few files may be open, everything is shown, or a line says what could not be read.

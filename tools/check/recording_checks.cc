@@ -165,18 +165,23 @@ Check foldingCheck(CheckScene& scene, const Recorders& recorders, const SegmentF
   const auto rows = waiting->scalars().size() + waiting->distributions().size();
   check.figures.push_back({&kRows, static_cast<double>(rows)});
   check.text = counted(segments, "segment");
-  if (rows == 0) {
+  const std::uint64_t leftOut = waiting->leftOut();
+  const std::uint64_t withoutRights = waiting->withoutRights();
+  if (rows == 0 && leftOut == 0 && withoutRights == 0) {
     check.text += ", nothing waits";
     return check;
   }
   const std::int64_t wait = longestWait(scene);
   check.state = stateOfAge(wait);
-  check.text += format(", %s with values that wait, for %s at most", counted(rows, "statistic"),
-                       ageText(wait));
-  if (waiting->leftOut() > 0) {
-    check.state = graver(check.state, CheckState::Warning);
-    check.text +=
-        format("; %lld more than a fold reads", static_cast<long long>(waiting->leftOut()));
+  check.text += rows > 0 ? format(", %s with values that wait, for %s at most",
+                                  counted(rows, "statistic"), ageText(wait))
+                         : format(", no fold took values for %s", ageText(wait));
+  if (leftOut > 0) {
+    addFinding(check, CheckState::Warning, counted(leftOut, "segment") + " not read");
+  }
+  if (withoutRights > 0) {
+    addFinding(check, CheckState::Warning,
+               counted(withoutRights, "segment") + " with values that cannot be folded now");
   }
   return check;
 }

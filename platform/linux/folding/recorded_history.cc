@@ -121,12 +121,16 @@ Expected<RecordedHistory> RecordedHistory::open(const DeviceRoot& root, SqliteSt
     history.waiting_ = *std::move(waiting);
     isOvertaken = !isSame(FoldNotes::lastMark(root), mark);
   }
-  if (const std::uint64_t leftOut = history.waiting_->leftOut(); leftOut > 0) {
-    history.missingValues_.push_back(std::to_string(leftOut) +
-                                     (leftOut == 1 ? " segment with values that wait is"
-                                                   : " segments with values that wait are") +
-                                     " not shown: run 'tavrelctl stat fold'");
-  }
+  const auto addMissing = [&history](std::uint64_t segments, const std::string& advice) {
+    if (segments == 0) return;
+    history.missingValues_.push_back(std::to_string(segments) +
+                                     (segments == 1 ? " segment with values that wait is"
+                                                    : " segments with values that wait are") +
+                                     " not shown: " + advice);
+  };
+  addMissing(history.waiting_->leftOut(), "run 'tavrelctl stat fold'");
+  addMissing(history.waiting_->withoutRights(),
+             "try again when the users in " + root.path(kRecordersFile) + " can be looked up");
   if (isOvertaken) {
     history.missingValues_.emplace_back(
         "folds took values during each attempt to read them, and some are not shown: run it again");

@@ -42,8 +42,8 @@ class Recorders {
 
   bool mayRecord(std::uint32_t user, std::string_view key) const;
 
-  /// False when a user could not be looked up: then a "no" may be wrong.
-  bool areUsersKnown() const { return areUsersKnown_; }
+  /// False when some user could not be looked up and `user` is not root: then `mayRecord` may err.
+  bool areRightsKnown(std::uint32_t user) const { return user == 0 || areUsersKnown_; }
 
  private:
   void add(std::string_view user, const plist::Value& prefixes, const std::string& path,

@@ -216,7 +216,6 @@ bool FoldRun::isStoreFull() const {
 }
 
 bool FoldRun::admit(const SegmentName& name) {
-  if (name.owner != 0 && !recorders_.areUsersKnown()) return false;
   if (name.owner != 0 && isStoreFull()) {
     notes_.logOnce(
         "the statistics store is far beyond its limit: what users other than root record waits "
@@ -269,8 +268,17 @@ Status FoldRun::takeValues(SqliteBatch& batch, OpenSegment segment, SegmentReade
     }
   }
   SegmentIntake intake(name.owner, recorders_, rows_, changes_, batch.waitingDistributions());
-  SegmentProgress progress = reader.read(position, boot_, isWriterGone, intake);
+  // What may be wrongly refused must wait.
+  SegmentLook look;
+  SegmentSink& sink =
+      recorders_.areRightsKnown(name.owner) ? static_cast<SegmentSink&>(intake) : look;
+  SegmentProgress progress = reader.read(position, boot_, isWriterGone, sink);
   if (Status done = reader.readable(); !done) return done;
+  if (look.hasValues()) {
+    ++report_.waiting;
+    ++report_.withoutRights;
+    return Done{};
+  }
   if (Status done = batch.limitWaiting(); !done) return done;
   const bool isOver = isWriterGone && progress.isComplete;
   if (isOver) position = SegmentPosition::end();
@@ -361,7 +369,7 @@ Status foldAll(const SegmentFolder& folder, SqliteStore& store, FoldNotes& notes
   if (!fold.hasReplacedStore()) return done;
   // The new store has no positions, and the values of earlier transactions are lost with the old
   // one.
-  report.waiting = 0;
+  report.waiting = report.withoutRights = 0;
   return FoldRun(folder, store, notes, recorders, report, storeBytes).run(listing);
 }
 
@@ -397,7 +405,7 @@ FoldReport SegmentFold::run() {
     const Status done = foldAll(**folder, store_, *notes, recorders, report, most, *listing);
     if (!done) {
       report.failure = done.error().message + "; what programs recorded waits for the next fold";
-    } else if (!recorders.areUsersKnown() && report.waiting > 0) {
+    } else if (report.withoutRights > 0) {
       report.failure = root_.path(kRecordersFile) +
                        " names users who cannot be looked up now; what users other than root "
                        "recorded waits for the next fold";

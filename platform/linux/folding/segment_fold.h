@@ -28,6 +28,7 @@ struct FoldReport {
   std::uint64_t values = 0;            // measurements
   std::uint64_t removed = 0;           // segments that nobody will write to any more
   std::uint64_t waiting = 0;           // segments left for the next fold
+  std::uint64_t withoutRights = 0;     // those of them whose users' rights are unknown
   std::uint64_t dropped = 0;           // values for which the programs had no room
   std::uint64_t refused = 0;           // values that were not taken
   std::uint64_t segmentsRefused = 0;   // files refused for the first time

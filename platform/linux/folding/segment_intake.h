@@ -80,4 +80,15 @@ class SegmentIntake final : public SegmentSink {
   std::string foreignKey_;
 };
 
+/// Takes nothing, and notes whether there was anything to take.
+class SegmentLook final : public SegmentSink {
+ public:
+  void takeScalar(const SegmentScalar&) override { hasValues_ = true; }
+  void takeRecord(const SegmentRecord&) override { hasValues_ = true; }
+  bool hasValues() const { return hasValues_; }
+
+ private:
+  bool hasValues_ = false;
+};
+
 }  // namespace tavrel

@@ -16,18 +16,18 @@ namespace {
 // Passes the selected values on.
 class SelectingSink final : public SegmentSink {
  public:
-  SelectingSink(const RowSelection& selection, SegmentIntake& intake)
-      : selection_(selection), intake_(intake) {}
+  SelectingSink(const RowSelection& selection, SegmentSink& sink)
+      : selection_(selection), sink_(sink) {}
   void takeScalar(const SegmentScalar& scalar) override {
-    if (selection_.contains(scalar.day, scalar.key)) intake_.takeScalar(scalar);
+    if (selection_.contains(scalar.day, scalar.key)) sink_.takeScalar(scalar);
   }
   void takeRecord(const SegmentRecord& record) override {
-    if (selection_.contains(record.day, *record.key)) intake_.takeRecord(record);
+    if (selection_.contains(record.day, *record.key)) sink_.takeRecord(record);
   }
 
  private:
   const RowSelection& selection_;
-  SegmentIntake& intake_;
+  SegmentSink& sink_;
 };
 
 Status writeAll(int file, ByteSpan bytes) {
@@ -67,9 +67,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
   FoldedRows rows;
   PendingDistributions buffer;
   for (const SegmentEntry& entry : listing->segments) {
-    // A fold would leave segments of unknown rights, too.
-    const bool isUnknown = entry.owner != 0 && !recorders.areUsersKnown();
-    if (isUnknown || waiting.blocks_ >= limits::kWaitingBlocks ||
+    if (waiting.blocks_ >= limits::kWaitingBlocks ||
         waiting.scalars_.bytes() >= limits::kFoldKeyBytes) {
       ++waiting.leftOut_;
       continue;
@@ -110,9 +108,13 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
     }
   }
   SegmentIntake intake(segment.entry.owner, recorders, rows, scalars_, buffer);
-  SelectingSink sink(selection, intake);
+  SegmentLook look;
+  SelectingSink sink(selection, recorders.areRightsKnown(segment.entry.owner)
+                                    ? static_cast<SegmentSink&>(intake)
+                                    : look);
   reader.read(position, currentBootInstant(), isWriterGone, sink);
   if (Status done = reader.readable(); !done) return done;
+  if (look.hasValues()) ++withoutRights_;
   Status added = Done{};
   buffer.each([&](std::int32_t day, std::string_view key, const DistributionBlock& block) {
     if (added) added = addSeries(selection, day, key, block);

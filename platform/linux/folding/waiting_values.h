@@ -58,9 +58,11 @@ class WaitingValues {
 
   const RowMap<ScalarChanges::Change>& scalars() const { return scalars_.rows(); }
   const RowMap<Series>& distributions() const { return distributions_; }
-  /// Segments that were left out because of a limit, because another version of this program began
-  /// to fold them, or because users cannot be looked up.
+  /// Segments that were left out because of a limit, or because another version of this program
+  /// began to fold them.
   std::uint64_t leftOut() const { return leftOut_; }
+  /// Segments with selected values that no fold takes while the users' rights are unknown.
+  std::uint64_t withoutRights() const { return withoutRights_; }
 
   /// The next measurements of the row, at most as many as fit; 0 at its end. Moves `place` past
   /// them.
@@ -77,6 +79,7 @@ class WaitingValues {
   ScalarChanges scalars_;
   RowMap<Series> distributions_;
   std::uint64_t leftOut_ = 0;
+  std::uint64_t withoutRights_ = 0;
   // Measurements in the order of segments, in an unmapped memory file.
   Descriptor copied_;
   std::uint64_t copies_ = 0;
