@@ -22,7 +22,7 @@ constexpr OutcomeTexts kTexts[] = {
     {"permission-unknown", "the permission cannot be read"},
     {"no-whitelist", "no usable whitelist; see 'tavrelctl whitelist check'"},
     {"nothing-to-report", "no value found for any whitelisted key"},
-    {"store-unreadable", "the statistics store could not be read; see the system log"},
+    {"store-unreadable", "not all statistics could be read; see the system log"},
     {"not-filed", "filing failed; see the system log"},
 };
 static_assert(std::size(kTexts) == static_cast<std::size_t>(LogOutcome::NotFiled) + 1);

@@ -143,7 +143,7 @@ TEST_F(DailyRunTest, SaysWhyThereIsNoLogAndRemembersIt) {
   fake.submission.fails = false;
   std::swap(fake.store.distributionsAreReadable, fake.store.scalarsAreReadable);
   EXPECT_EQ(run(7), "a log for day 7" + inPart);
-  const std::string unreadable = ": the statistics store could not be read; see the system log";
+  const std::string unreadable = ": not all statistics could be read; see the system log";
   EXPECT_EQ(run(8), "no log for day 8" + unreadable);
   EXPECT_EQ(own.get("LastLogOutcome"), plist::Value("store-unreadable"));
   std::swap(fake.store.distributionsAreReadable, fake.store.scalarsAreReadable);

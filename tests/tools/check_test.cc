@@ -169,7 +169,7 @@ TEST_F(CheckTest, JudgesTheLastLog) {
          1},
         {"store-unreadable",
          "CRITICAL last-log: the last daily run: no" + day +
-             ": the statistics store could not be read; see the system log\n",
+             ": not all statistics could be read; see the system log\n",
          2},
         {"not-filed",
          "CRITICAL last-log: the last daily run: no" + day +

@@ -132,7 +132,7 @@ TEST_F(StatFoldTest, PreviewsSayWhatAUserMayNotRead) {
   const Outcome rehearsed = run("rehearse --today");
   expectOnce(rehearsed, others);
   expectOnce(rehearsed, "the run would log 1 error; the first: ");
-  expectIn(rehearsed.out, {": the statistics store could not be read; see "});
+  expectIn(rehearsed.out, {": not all statistics could be read; see "});
   expectOnce(run("page -o - --day today"), others);
 
   std::filesystem::permissions(store, std::filesystem::perms{0644});
