@@ -13,7 +13,7 @@ clock '2037-11-22 12:00'
 systemctl start tavrel-daily.service
 expect "a run with the clock set back" "success 0" "$(outcome tavrel-daily.service)"
 expect "it files nothing" log-tallied "$(logs pending)$(logs outbox)"
-expect "the clock is told" "WARNING clock: today is day 24797 (2037-11-22), and day 24798 \
+expect "the clock is reported" "WARNING clock: today is day 24797 (2037-11-22), and day 24798 \
 (2037-11-23) was already reported: the clock was set back, and no run comes before then" \
   "$(tavrelctl status --check | grep ' clock: ')"
 

@@ -46,5 +46,5 @@ expect "folder of those who record" "1770 root brimhold" "$(stat -c '%a %U %G' /
 systemctl start tavrel-daily.service
 expect "a run in 1970" "success 0" "$(outcome tavrel-daily.service)"
 expect "it files nothing" "" "$(logs pending)"
-expect "the wrong clock is told" "CRITICAL clock: today is day 0 (1970-01-01), before this program \
+expect "the wrong clock is reported" "CRITICAL clock: today is day 0 (1970-01-01), before this program \
 was built: set the clock" "$(tavrelctl status --check | grep ' clock: ')"
