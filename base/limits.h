@@ -1,5 +1,5 @@
-// Every limit on data from outside, with its unit and its reason. The code that drops or refuses
-// something because of a limit reports it, unless the limit's comment says otherwise.
+// Limits of the device's programs, with unit and reason; fleet/ and client/ have their own. Code
+// that drops or refuses something because of one reports it, unless its comment says otherwise.
 #pragma once
 
 #include <cstddef>
