@@ -10,6 +10,7 @@
 #include "tools/overlay/overlay_platform.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_model.h"
+#include "tools/whitelist/whitelist_rules.h"
 
 using namespace tavrel;
 
@@ -21,25 +22,12 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-void compare(const BHConfig& config, const WhitelistModel& model,
-             const WhitelistDecisions& decisions, std::string_view key) {
-  using Table = WhitelistTable;
-  const auto compareKind = [&](Table keys, Table prefixes, const plist::Dictionary& found) {
-    const auto decision = decisions.decide(keys, prefixes, key);
-    require((decision.rule == WhitelistDecision::Rule::None) == !found);
-    if (!found) return;
-    const bool exact = decision.rule == WhitelistDecision::Rule::Exact;
-    const std::string_view name = exact ? key : decision.prefix;
-    bool known = false;
-    for (const WhitelistRule& rule : model.rules(exact ? keys : prefixes)) {
-      known = known || (rule.group == decision.group && rule.key == name &&
-                        plist::Value(rule.options) == plist::Value(found));
-    }
-    require(known);
-  };
-  compareKind(Table::ScalarKeys, Table::ScalarPrefixes, config.configOptionsForScalarKey(key));
-  compareKind(Table::DistributionKeys, Table::DistributionPrefixes,
-              config.configOptionsForDistributionKey(key));
+void compare(const WhitelistRules& rules, const plist::Dictionary& found, std::string_view key) {
+  const WhitelistRule* const rule = rules.ofKey(key);
+  require((rule != nullptr) == static_cast<bool>(found));
+  if (rule == nullptr) return;
+  require(isPrefixTable(rule->table) ? key.starts_with(rule->key) : key == rule->key);
+  require(plist::Value(rule->options) == plist::Value(found));
 }
 
 }  // namespace
@@ -62,15 +50,19 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   checkWhitelist(*whitelist);
 
   const WhitelistModel model(*whitelist);
-  const WhitelistDecisions decisions(
-      model, false, [](std::string_view group) { return group != kInternalTestingGroup; });
+  const WhitelistRules scalars(model, false);
+  const WhitelistRules distributions(model, true);
+  const auto compareBoth = [&](std::string_view key) {
+    compare(scalars, config->configOptionsForScalarKey(key), key);
+    compare(distributions, config->configOptionsForDistributionKey(key), key);
+  };
   for (std::size_t table = 0; table < kWhitelistTables.size(); ++table) {
     std::size_t compared = 0;
     for (const WhitelistRule& rule : model.rules(static_cast<WhitelistTable>(table))) {
       if (++compared > kComparedRules) break;
-      compare(*config, model, decisions, rule.key);
-      compare(*config, model, decisions, std::string(rule.key) + "x");
-      compare(*config, model, decisions, rule.key.substr(0, rule.key.size() / 2));
+      compareBoth(rule.key);
+      compareBoth(std::string(rule.key) + "x");
+      compareBoth(rule.key.substr(0, rule.key.size() / 2));
     }
   }
   return 0;

@@ -14,13 +14,14 @@
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
 #include "tools/shared/typed_value.h"
-#include "tools/shared/value_text.h"
 #include "tools/whitelist/whitelist_coarseness.h"
+#include "tools/whitelist/whitelist_model.h"
+#include "tools/whitelist/whitelist_rules.h"
 
 namespace tavrel {
 namespace {
 
-using Rule = WhitelistDecision::Rule;
+using Rule = KindExplanation::Rule;
 
 constexpr std::string_view kLabels[] = {"  scalar        ", "  distribution  "};
 constexpr std::string_view kContinuation = "                ";
@@ -30,13 +31,21 @@ std::string_view textOf(BHConfig::Exclusion exclusion) {
                                                         : "it is switched off by tasking";
 }
 
-KindExplanation explainKind(const WhitelistDecision& decision, const WhitelistDecision& ifAllLoaded,
-                            const plist::Dictionary& options, const BHConfig& config) {
-  KindExplanation explanation{
-      decision.rule, std::string(decision.group), std::string(decision.prefix), options, {}, {}};
-  if (ifAllLoaded.group != decision.group) {
-    if (const auto exclusion = config.exclusionOf(ifAllLoaded.group)) {
-      explanation.idleGroup = ifAllLoaded.group;
+KindExplanation explainKind(const WhitelistRule* rule, const WhitelistRule* ifAllLoaded,
+                            const plist::Dictionary& options, const BHConfig& config,
+                            bool isInternalDevice) {
+  KindExplanation explanation;
+  explanation.options = options;
+  if (rule != nullptr) {
+    explanation.rule = isPrefixTable(rule->table) ? Rule::Prefix : Rule::Exact;
+    explanation.group = rule->group;
+    if (explanation.rule == Rule::Prefix) explanation.prefix = rule->key;
+  } else if (isInternalDevice) {
+    explanation.rule = Rule::Internal;
+  }
+  if (ifAllLoaded != nullptr && (rule == nullptr || ifAllLoaded->group != rule->group)) {
+    if (const auto exclusion = config.exclusionOf(ifAllLoaded->group)) {
+      explanation.idleGroup = ifAllLoaded->group;
       explanation.idleReason = textOf(*exclusion);
     }
   }
@@ -128,24 +137,22 @@ Expected<std::vector<KeyExplanation>> explainKeys(LinuxPlatform& device, const s
 
   const WhitelistModel model(whitelist);
   const bool isInternal = BHIsInternalDevice(platform);
-  const WhitelistDecisions loaded(
-      model, isInternal, [&](std::string_view group) { return !config->exclusionOf(group); });
-  const WhitelistDecisions all(model, isInternal, [](std::string_view) { return true; });
+  const auto isLoaded = [&](std::string_view group) { return !config->exclusionOf(group); };
+  const auto isAny = [](std::string_view) { return true; };
+  const WhitelistRules loadedScalars(model, false, isLoaded);
+  const WhitelistRules allScalars(model, false, isAny);
+  const WhitelistRules loadedDistributions(model, true, isLoaded);
+  const WhitelistRules allDistributions(model, true, isAny);
 
   std::vector<KeyExplanation> explanations;
   for (const std::string& key : keys) {
-    const auto explain = [&](WhitelistTable exact, WhitelistTable prefixes,
-                             const plist::Dictionary& options) {
-      return explainKind(loaded.decide(exact, prefixes, key), all.decide(exact, prefixes, key),
-                         options, *config);
-    };
     KeyExplanation explanation;
     explanation.key = key;
-    explanation.scalar = explain(WhitelistTable::ScalarKeys, WhitelistTable::ScalarPrefixes,
-                                 config->configOptionsForScalarKey(key));
+    explanation.scalar = explainKind(loadedScalars.ofKey(key), allScalars.ofKey(key),
+                                     config->configOptionsForScalarKey(key), *config, isInternal);
     explanation.distribution =
-        explain(WhitelistTable::DistributionKeys, WhitelistTable::DistributionPrefixes,
-                config->configOptionsForDistributionKey(key));
+        explainKind(loadedDistributions.ofKey(key), allDistributions.ofKey(key),
+                    config->configOptionsForDistributionKey(key), *config, isInternal);
     explanation.example = example;
     if (example && example->scalar && explanation.scalar.options) {
       explanation.coarsenedScalar = coarsened(*example->scalar, explanation.scalar.options);

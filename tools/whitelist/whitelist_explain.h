@@ -11,7 +11,6 @@
 #include "base/expected.h"
 #include "base/plist.h"
 #include "tools/shared/tool_context.h"
-#include "tools/whitelist/whitelist_model.h"
 
 namespace tavrel {
 
@@ -25,7 +24,8 @@ struct ExampleValue {
 Expected<ExampleValue> parseExampleValue(std::string_view text);
 
 struct KindExplanation {
-  WhitelistDecision::Rule rule = WhitelistDecision::Rule::None;
+  enum class Rule : std::uint8_t { None, Exact, Prefix, Internal };
+  Rule rule = Rule::None;
   std::string group;
   std::string prefix;
   /// The options that the daemon finds; an empty handle when the key is not reported.

@@ -36,29 +36,4 @@ WhitelistModel::WhitelistModel(plist::Value whitelist) : whitelist_(std::move(wh
   }
 }
 
-void WhitelistDecisions::buildTrees() {
-  for (std::size_t table = 0; table < kWhitelistTables.size(); ++table) {
-    if (!isPrefixTable(static_cast<WhitelistTable>(table))) continue;
-    std::vector<std::string> prefixes;
-    prefixes.reserve(groups_[table].size());
-    for (const auto& [prefix, group] : groups_[table])
-      prefixes.emplace_back(prefix);
-    trees_[table] = PrefixTree(std::move(prefixes));
-  }
-}
-
-WhitelistDecision WhitelistDecisions::decide(WhitelistTable keys, WhitelistTable prefixes,
-                                             std::string_view key) const {
-  using Rule = WhitelistDecision::Rule;
-  const auto& exact = groups_[static_cast<std::size_t>(keys)];
-  if (const auto at = exact.find(key); at != exact.end()) return {Rule::Exact, at->second, {}};
-
-  const auto prefixTable = static_cast<std::size_t>(prefixes);
-  if (const auto prefix = trees_[prefixTable].longestMatch(key)) {
-    const auto at = groups_[prefixTable].find(*prefix);
-    return {Rule::Prefix, at->second, at->first};
-  }
-  return {isInternalDevice_ ? Rule::Internal : Rule::None, {}, {}};
-}
-
 }  // namespace tavrel

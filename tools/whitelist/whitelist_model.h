@@ -4,7 +4,7 @@
 // the tool can say which rule decides and which have no effect.
 //
 //   const WhitelistModel model(*decoded);
-//   const WhitelistDecisions decisions(model, isInternal, isLoaded);
+//   const WhitelistRules scalars(model, false, isLoaded);  // tools/whitelist/whitelist_rules.h
 #pragma once
 
 #include <array>
@@ -12,7 +12,6 @@
 #include <cstdint>
 #include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "base/plist.h"
@@ -63,42 +62,6 @@ class WhitelistModel {
  private:
   plist::Value whitelist_;  // keeps what the rules borrow
   std::array<std::vector<WhitelistRule>, kWhitelistTables.size()> rules_;
-};
-
-/// What the whitelist decides about one key.
-struct WhitelistDecision {
-  enum class Rule : std::uint8_t { None, Exact, Prefix, Internal };
-  Rule rule = Rule::None;
-  std::string_view group;  // of the rule; empty for `None` and `Internal`
-  std::string_view prefix;
-};
-
-/// Finds the rule that decides about a key, in time that does not depend on the number of rules.
-/// The model must outlive it.
-class WhitelistDecisions {
- public:
-  /// `isLoaded` says whether the daemon loads a group of this name.
-  template <class IsLoaded>
-  WhitelistDecisions(const WhitelistModel& model, bool isInternalDevice, IsLoaded isLoaded)
-      : isInternalDevice_(isInternalDevice) {
-    for (std::size_t table = 0; table < kWhitelistTables.size(); ++table) {
-      for (const WhitelistRule& rule : model.rules(static_cast<WhitelistTable>(table))) {
-        if (isLoaded(rule.group)) groups_[table][rule.key] = rule.group;
-      }
-    }
-    buildTrees();
-  }
-
-  WhitelistDecision decide(WhitelistTable keys, WhitelistTable prefixes,
-                           std::string_view key) const;
-
- private:
-  void buildTrees();
-
-  bool isInternalDevice_;
-  std::array<std::unordered_map<std::string_view, std::string_view>, kWhitelistTables.size()>
-      groups_;  // by key or prefix: the group that decides
-  std::array<PrefixTree, kWhitelistTables.size()> trees_;  // of the prefix tables
 };
 
 }  // namespace tavrel

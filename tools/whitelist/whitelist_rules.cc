@@ -9,21 +9,30 @@
 namespace tavrel {
 namespace {
 
-WhitelistRules::Rules rulesOf(const WhitelistModel& model, WhitelistTable table) {
+WhitelistRules::Rules rulesOf(const WhitelistModel& model, WhitelistTable table,
+                              const WhitelistRules::IsLoaded& isLoaded) {
   WhitelistRules::Rules rules;
   for (const WhitelistRule& rule : model.rules(table)) {
-    if (rule.group != kInternalTestingGroup) rules[rule.key] = &rule;
+    if (isLoaded(rule.group)) rules[rule.key] = &rule;
   }
   return rules;
 }
 
 }  // namespace
 
-WhitelistRules::WhitelistRules(const WhitelistModel& model, bool isDistribution)
-    : keys_(rulesOf(
-          model, isDistribution ? WhitelistTable::DistributionKeys : WhitelistTable::ScalarKeys)),
-      prefixes_(rulesOf(model, isDistribution ? WhitelistTable::DistributionPrefixes
-                                              : WhitelistTable::ScalarPrefixes)) {
+bool isLoadedByDefault(std::string_view group) {
+  return group != kInternalTestingGroup;
+}
+
+WhitelistRules::WhitelistRules(const WhitelistModel& model, bool isDistribution,
+                               const IsLoaded& isLoaded)
+    : keys_(rulesOf(model,
+                    isDistribution ? WhitelistTable::DistributionKeys : WhitelistTable::ScalarKeys,
+                    isLoaded)),
+      prefixes_(rulesOf(
+          model,
+          isDistribution ? WhitelistTable::DistributionPrefixes : WhitelistTable::ScalarPrefixes,
+          isLoaded)) {
   std::vector<std::string> prefixes;
   prefixes.reserve(prefixes_.size());
   for (const auto& [prefix, rule] : prefixes_)
