@@ -2,7 +2,6 @@
 
 #include <utility>
 
-#include "base/format.h"
 #include "fleet/logs/limits.h"
 #include "fleet/sources/file_name.h"
 #include "fleet/sources/limits.h"

@@ -5,7 +5,6 @@
 #include <string>
 
 #include "base/expected.h"
-#include "fleet/logs/log_metadata.h"
 #include "fleet/sources/source_item.h"
 #include "fleet/sources/upload_lines.h"
 

@@ -7,7 +7,6 @@
 #include <sys/statvfs.h>
 #include <unistd.h>
 
-#include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"

@@ -2,7 +2,6 @@
 #include <cmath>
 #include <iterator>
 
-#include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "platform/platform.h"
 #include "tools/export/exports.h"

@@ -5,7 +5,6 @@
 
 #include "base/format.h"
 #include "base/iso_date.h"
-#include "base/text.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/log_day.h"
 #include "tools/log/log_faults.h"

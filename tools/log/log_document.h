@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "base/plist.h"
-#include "tools/shared/tool_context.h"
+#include "tools/shared/tool_output.h"
 
 namespace tavrel {
 

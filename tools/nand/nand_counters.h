@@ -5,7 +5,7 @@
 #include <string_view>
 
 #include "storage/telemetry_counters.h"
-#include "tools/shared/tool_context.h"
+#include "tools/shared/tool_output.h"
 
 namespace tavrel {
 

@@ -11,7 +11,7 @@
 #include <string_view>
 
 #include "tools/shared/json_writer.h"
-#include "tools/shared/tool_context.h"
+#include "tools/shared/tool_output.h"
 
 namespace tavrel {
 

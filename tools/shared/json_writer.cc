@@ -5,7 +5,7 @@
 #include <nlohmann/json.hpp>
 
 #include "base/utf8.h"
-#include "tools/shared/tool_context.h"
+#include "tools/shared/tool_output.h"
 
 namespace tavrel {
 namespace {

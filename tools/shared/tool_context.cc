@@ -2,7 +2,6 @@
 
 #include <stdexcept>
 
-#include "base/format.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"

@@ -8,7 +8,6 @@
 
 #include "base/format.h"
 #include "base/limits.h"
-#include "base/text.h"
 #include "config/bh_config.h"
 #include "tools/shared/value_text.h"
 #include "tools/whitelist/whitelist_coarseness.h"

@@ -7,7 +7,6 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "config/bh_config.h"
-#include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "report/histogram.h"
 #include "tools/shared/day_argument.h"

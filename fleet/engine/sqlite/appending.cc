@@ -1,7 +1,5 @@
 #include "fleet/engine/sqlite/appending.h"
 
-#include "fleet/engine/sqlite/row_id.h"
-
 namespace tavrel::fleet {
 namespace {
 

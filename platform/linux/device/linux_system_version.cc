@@ -4,7 +4,6 @@
 
 #include "base/ascii.h"
 #include "base/limits.h"
-#include "platform/linux/files/line_reader.h"
 #include "platform/linux/files/property_list_file.h"
 #include "platform/submission.h"
 

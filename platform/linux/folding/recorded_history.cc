@@ -4,7 +4,6 @@
 #include <array>
 #include <utility>
 
-#include "base/arithmetic.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/fold_notes.h"
 

@@ -4,7 +4,6 @@
 
 #include "base/ascii.h"
 #include "base/format.h"
-#include "platform/linux/files/line_reader.h"
 #include "platform/linux/health/log_page.h"
 
 namespace tavrel::health {

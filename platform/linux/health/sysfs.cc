@@ -11,7 +11,6 @@
 #include "base/parse_number.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/file_system.h"
-#include "platform/linux/files/line_reader.h"
 
 namespace tavrel::health {
 namespace {

@@ -6,7 +6,6 @@
 #include "base/civil_time.h"
 #include "base/limits.h"
 #include "platform/linux/files/folder_walk.h"
-#include "platform/linux/files/stamp.h"
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/persisted_state.h"
