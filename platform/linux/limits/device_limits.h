@@ -14,6 +14,8 @@
 #include "base/expected.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/logs/file_crash_reporting.h"
+#include "platform/linux/logs/log_folder.h"
 #include "platform/property_list_coding.h"
 
 namespace tavrel {
@@ -75,7 +77,7 @@ inline constexpr std::array kKeptKinds = {
              "withheld logs",
              "log",
              "com.norvane.tavrel.limits.withheld.logs",
-             {8, kMebibyte}},
+             {kWithheldLogs, kMebibyte}},
     KeptKind{Kept::Refused,
              "Refused",
              "refused logs",
@@ -87,7 +89,7 @@ inline constexpr std::array kKeptKinds = {
              "structured records",
              "file",
              "com.norvane.tavrel.limits.records.files",
-             {31, 2 * kMebibyte}},
+             {FileCrashReporting::kDaysKept, 2 * kMebibyte}},
     KeptKind{Kept::EccEvents,
              "EccEvents",
              "memory errors",

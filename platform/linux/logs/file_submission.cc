@@ -13,8 +13,6 @@
 namespace tavrel {
 namespace {
 
-constexpr std::size_t kWithheldLogs = 8;
-
 // Logs are readable only by their owner and a group of operators; withheld logs only by their
 // owner.
 constexpr mode_t kMode = 0640;

@@ -27,6 +27,9 @@ inline constexpr std::string_view kOutboxFolder = "outbox";      // to be sent
 inline constexpr std::string_view kWithheldFolder = "withheld";  // never sent
 inline constexpr std::string_view kRefusedFolder = "refused";    // by the server
 
+/// The number of withheld logs that are kept, the newest.
+inline constexpr std::size_t kWithheldLogs = 8;
+
 inline constexpr std::string_view kLogEnding = ".log";
 
 /// The ending of a log's metadata file, whose name otherwise equals the log's.
