@@ -10,6 +10,7 @@
 #include <string_view>
 #include <unordered_map>
 
+#include "base/keyed_hash.h"
 #include "statsd/statsd_line.h"
 
 namespace tavrel {
@@ -43,13 +44,7 @@ class StatsdRecorder {
     BHClientDistributionKey* series = nullptr;
     double remainder = 0;  // of a scalar: the fraction below one; of a series: that of its copies
   };
-  struct Hash {
-    using is_transparent = void;
-    std::size_t operator()(std::string_view text) const {
-      return std::hash<std::string_view>()(text);
-    }
-  };
-  using Keys = std::unordered_map<std::string, Key, Hash, std::equal_to<>>;
+  using Keys = std::unordered_map<std::string, Key, KeyedHash, std::equal_to<>>;
 
   void takeLine(std::string_view text);
   bool record(const StatsdLine& line);
