@@ -4,13 +4,9 @@
 #include <optional>
 #include <string_view>
 
-namespace tavrel::fleet {
+#include "fleet/model/interval.h"
 
-/// The values above `lower`, up to and including `upper`.
-struct Interval {
-  double lower = 0;
-  double upper = 0;
-};
+namespace tavrel::fleet {
 
 /// Nothing when the text is not such a label, or when the interval holds no value.
 std::optional<Interval> parseIntervalLabel(std::string_view label);

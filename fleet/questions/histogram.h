@@ -5,6 +5,8 @@
 #include <span>
 #include <vector>
 
+#include "fleet/model/interval.h"
+
 namespace tavrel::fleet {
 
 /// `count` values above `lower`, up to and including `upper`; `lower` is less than `upper`.
@@ -31,14 +33,6 @@ struct Piece {
 std::vector<Piece> piecesOf(std::span<const Cell> cells);
 
 std::uint64_t valuesOf(std::span<const Cell> cells);
-
-/// Above `lower`, up to and including `upper`.
-struct Interval {
-  double lower = 0;
-  double upper = 0;
-
-  bool operator==(const Interval&) const = default;
-};
 
 /// For each percent, the narrowest interval that the cells allow for the value of rank
 /// ceil(percent × n / 100) among their n values in ascending order. Nothing without values.
