@@ -118,6 +118,50 @@ void writeHistogramOf(page::HtmlWriter& html, const ShownSet& set, const std::st
   html.end();
 }
 
+void writeHistograms(page::HtmlWriter& html, const ShowSide& side, const std::string& name) {
+  const std::span sets = side.groups.empty() ? std::span(&side.whole, 1) : std::span(side.groups);
+  std::size_t buckets = 0;
+  for (const ShownSet& set : sets)
+    buckets += set.histogram.pieces.size();
+  if (buckets > kMostBars) {
+    html.element("p",
+                 "tavrel-fleet show --buckets prints the histograms, which have " +
+                     countText(buckets) + " buckets.",
+                 {{"class", "note"}});
+    return;
+  }
+  html.begin("div", {{"class", "cards"}});
+  for (const ShownSet& set : sets)
+    writeHistogramOf(html, set, name);
+  html.end();
+}
+
+void writeStatistic(page::HtmlWriter& html, const ShowAnswer& answer) {
+  const ShowSide& side = answer.sides.front();
+  const std::string name = nameOf(answer.request.key);
+  const std::string_view unit = catalogue::unitOf(answer.request.key);
+  html.begin("h3");
+  html.name(name);
+  html.end();
+  html.begin("p", {{"class", "note"}});
+  if (name != answer.request.key) {
+    html.name(answer.request.key);
+    html.text(", ");
+  }
+  const bool isScalar = answer.request.kind == KeyKind::kScalar;
+  html.text(isScalar ? "one value per log" : "many values per log");
+  if (!unit.empty()) html.text(" (" + std::string(unit) + ")");
+  html.end();
+  writeSets(html, side, name, unit);
+  const std::size_t withoutMean = side.whole.merged ? side.whole.merged->logsWithoutMean : 0;
+  if (withoutMean != 0) {
+    html.element("p",
+                 "The mean is without " + withoutMeanText(withoutMean, answer.devicesAtLeast) + ".",
+                 {{"class", "note"}});
+  }
+  writeHistograms(html, side, name);
+}
+
 }  // namespace
 
 std::string countText(std::size_t count) {
@@ -167,51 +211,13 @@ void writeStatistics(page::HtmlWriter& html, const std::vector<ShowAnswer>& answ
                      std::size_t further) {
   std::size_t hidden = 0;
   for (const ShowAnswer& answer : answers) {
-    const ShowSide& side = answer.sides.front();
-    if (!side.isShown) {
+    if (!answer.sides.front().isShown) {
       ++hidden;
-      continue;
-    }
-    if (html.written().size() >= kMostSectionBytes) {
+    } else if (html.written().size() >= kMostSectionBytes) {
       ++further;
-      continue;
+    } else {
+      writeStatistic(html, answer);
     }
-    const std::string name = nameOf(answer.request.key);
-    const std::string_view unit = catalogue::unitOf(answer.request.key);
-    html.begin("h3");
-    html.name(name);
-    html.end();
-    html.begin("p", {{"class", "note"}});
-    if (name != answer.request.key) {
-      html.name(answer.request.key);
-      html.text(", ");
-    }
-    const bool isScalar = answer.request.kind == KeyKind::kScalar;
-    html.text(isScalar ? "one value per log" : "many values per log");
-    if (!unit.empty()) html.text(" (" + std::string(unit) + ")");
-    html.end();
-    writeSets(html, side, name, unit);
-    const std::size_t withoutMean = side.whole.merged ? side.whole.merged->logsWithoutMean : 0;
-    if (withoutMean != 0) {
-      html.element(
-          "p", "The mean is without " + withoutMeanText(withoutMean, answer.devicesAtLeast) + ".",
-          {{"class", "note"}});
-    }
-    const std::span sets = side.groups.empty() ? std::span(&side.whole, 1) : std::span(side.groups);
-    std::size_t buckets = 0;
-    for (const ShownSet& set : sets)
-      buckets += set.histogram.pieces.size();
-    if (buckets > kMostBars) {
-      html.element("p",
-                   "tavrel-fleet show --buckets prints the histograms, which have " +
-                       countText(buckets) + " buckets.",
-                   {{"class", "note"}});
-      continue;
-    }
-    html.begin("div", {{"class", "cards"}});
-    for (const ShownSet& set : sets)
-      writeHistogramOf(html, set, name);
-    html.end();
   }
   if (hidden != 0) {
     html.element("p", "Not shown: " + counted(hidden, "statistic") + " of too few devices.",

@@ -12,9 +12,11 @@ namespace {
 /// All choices of so many components are tried. Of more, some are joined first.
 constexpr std::size_t kMostComponents = 12;
 
+}  // namespace
+
 /// Disjoint sets of groups. The smallest group of a set stands for it, in whatever order they were
 /// united: cells are in the order of loading, and answers must not depend on it.
-class Components {
+class Crossing::Components {
  public:
   explicit Components(std::size_t groups) : parent_(groups) {
     std::iota(parent_.begin(), parent_.end(), 0U);
@@ -35,8 +37,6 @@ class Components {
  private:
   std::vector<std::uint32_t> parent_;
 };
-
-}  // namespace
 
 Crossing::Crossing(const LogTable& table, const std::vector<const LogSet*>& groups,
                    const Sets& earlier, std::size_t devicesAtLeast)
@@ -78,7 +78,28 @@ std::vector<std::size_t> Crossing::groupsToJoin(const std::vector<bool>& isJoine
   for (const Cell& cell : cells_)
     if (cell.logs >= devicesAtLeast_) components.unite(cell.group, cell.earlier);
 
-  std::vector<Cell> between;  // of components, in place of groups
+  const Few few = componentsThatLeaveFew(settle(components));
+  std::vector<std::size_t> result;
+  std::vector<bool> isInvolved(groups_ + earlier_);
+  for (const std::uint32_t component : few.components)
+    isInvolved[component] = true;
+  // Joining groups of one component changes nothing.
+  if (joined) isInvolved[components.of(*joined)] = false;
+  for (const bool wantsInvolved : {true, false}) {
+    for (const std::size_t group : order) {
+      if (result.size() < few.groupsToJoin && !isJoined[group] &&
+          isInvolved[components.of(group)] == wantsInvolved) {
+        result.push_back(group);
+      }
+    }
+    if (!result.empty()) break;
+  }
+  return result;
+}
+
+std::vector<Crossing::Cell> Crossing::settle(Components& components) const {
+  const auto pairOf = [](const Cell& cell) { return std::tuple(cell.group, cell.earlier); };
+  std::vector<Cell> between;
   for (bool hasChanged = true; hasChanged;) {
     hasChanged = false;
     between.clear();
@@ -87,7 +108,6 @@ std::vector<std::size_t> Crossing::groupsToJoin(const std::vector<bool>& isJoine
       const std::uint32_t earlier = components.of(cell.earlier);
       if (group != earlier) between.push_back({group, earlier, cell.day, cell.logs});
     }
-    const auto pairOf = [](const Cell& cell) { return std::tuple(cell.group, cell.earlier); };
     std::sort(between.begin(), between.end(), [](const Cell& a, const Cell& b) {
       return std::tie(a.group, a.earlier, a.day) < std::tie(b.group, b.earlier, b.day);
     });
@@ -105,24 +125,7 @@ std::vector<std::size_t> Crossing::groupsToJoin(const std::vector<bool>& isJoine
       }
     }
   }
-
-  const Few few = componentsThatLeaveFew(between);
-  std::vector<std::size_t> result;
-  std::vector<bool> isInvolved(groups_ + earlier_);
-  for (const std::uint32_t component : few.components)
-    isInvolved[component] = true;
-  // Joining groups of one component changes nothing.
-  if (joined) isInvolved[components.of(*joined)] = false;
-  for (const bool wantsInvolved : {true, false}) {
-    for (const std::size_t group : order) {
-      if (result.size() < few.groupsToJoin && !isJoined[group] &&
-          isInvolved[components.of(group)] == wantsInvolved) {
-        result.push_back(group);
-      }
-    }
-    if (!result.empty()) break;
-  }
-  return result;
+  return between;
 }
 
 Crossing::Few Crossing::componentsThatLeaveFew(const std::vector<Cell>& between) const {

@@ -38,10 +38,15 @@ class Crossing {
     std::uint32_t logs;
   };
 
+  class Components;
   struct Few {
     std::vector<std::uint32_t> components;
     std::size_t groupsToJoin = 0;
   };
+
+  /// Unites components that are taken or subtracted only together, until there are none. Returns
+  /// the intersections that remain, of components in place of groups.
+  std::vector<Cell> settle(Components& components) const;
   /// `between` are the intersections of components. Returns components some of which could leave
   /// few devices.
   Few componentsThatLeaveFew(const std::vector<Cell>& between) const;

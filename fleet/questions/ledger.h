@@ -37,6 +37,7 @@ class Ledger {
 
   using Sets = std::vector<std::shared_ptr<const LogSet>>;
   using Shown = std::map<std::string, Sets>;
+  /// By subject. Tests check that no small set follows from these.
   const Shown& shown() const { return shown_; }
 
   /// Notes the parts of a whole as shown.
