@@ -2,12 +2,9 @@
 
 #include <algorithm>
 #include <array>
-#include <cerrno>
 #include <cmath>
 #include <cstdint>
 #include <cstring>
-#include <fcntl.h>
-#include <sys/file.h>
 
 #include "base/ascii.h"
 #include "base/civil_time.h"
@@ -16,7 +13,6 @@
 #include "base/limits.h"
 #include "platform/linux/files/random.h"
 #include "platform/linux/files/stamp.h"
-#include "platform/linux/files/system_error.h"
 #include "platform/linux/logs/log_day.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/persisted_state.h"
@@ -46,15 +42,7 @@ bool isPlain(std::string_view name) {
 
 // Prevents concurrent runs; nothing while another process holds the lock.
 Expected<std::optional<Descriptor>> lockRun(const Services& services) {
-  const std::string path = services.root.path(kLockPath);
-  if (Status made = services.files.makeFolders(path.substr(0, path.rfind('/'))); !made) {
-    return made.error();
-  }
-  Descriptor lock(open(path.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NOCTTY, 0600));
-  if (!lock) return systemError("open", path);
-  if (flock(lock.get(), LOCK_EX | LOCK_NB) == 0) return std::optional(std::move(lock));
-  if (errno == EWOULDBLOCK) return std::optional<Descriptor>();
-  return systemError("lock", path);
+  return services.files.lockFileIfFree(services.root.path(kLockPath));
 }
 
 }  // namespace

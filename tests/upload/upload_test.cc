@@ -396,9 +396,13 @@ TEST(Upload, LosesNoLogThatChangesMeanwhile) {
   EXPECT_EQ(requests, 5);
 
   const Descriptor lock = device.lockRuns();
+  ASSERT_EQ(fchmod(lock.get(), 0644), 0);
   device.add(nameOf(1));
   device.log.lines.clear();
   EXPECT_EQ(device.run(), Outcome::Done) << "while another uploader is at work";
+  EXPECT_EQ(FileSystem::status(device.root.path("/var/lib/tavrel/upload/lock"))->st_mode,
+            S_IFREG | 0600)
+      << "nobody else can lock it";
   EXPECT_EQ(device.log.lines, Lines{});
   EXPECT_EQ(requests, 5);
 }

@@ -279,12 +279,26 @@ Status FileSystem::makePrivateFolder(const std::string& path) {
   return Done{};
 }
 
-Expected<Descriptor> FileSystem::lockFile(const std::string& path, const LockPatience& patience) {
+Expected<Descriptor> FileSystem::openLock(const std::string& path) {
   Expected<Descriptor> descriptor = openOrMake(path, O_RDWR, kLockMode);
-  if (descriptor) descriptor = keepFromOthers(*std::move(descriptor), path);
+  if (!descriptor) return descriptor;
+  return keepFromOthers(*std::move(descriptor), path);
+}
+
+Expected<Descriptor> FileSystem::lockFile(const std::string& path, const LockPatience& patience) {
+  Expected<Descriptor> descriptor = openLock(path);
   if (!descriptor) return descriptor;
   if (Status locked = lock(descriptor->get(), path, patience); !locked) return locked.error();
   return descriptor;
+}
+
+Expected<std::optional<Descriptor>> FileSystem::lockFileIfFree(const std::string& path) {
+  Expected<Descriptor> descriptor = openLock(path);
+  if (!descriptor) return descriptor.error();
+  const auto isLocked = tryLock(descriptor->get(), path);
+  if (!isLocked) return isLocked.error();
+  if (!*isLocked) return std::optional<Descriptor>();
+  return std::optional(*std::move(descriptor));
 }
 
 Expected<Descriptor> FileSystem::openFolderLock(const std::string& folder) {
@@ -326,11 +340,20 @@ Expected<Descriptor> FileSystem::keepFromOthers(Descriptor lock, const std::stri
   return lock;
 }
 
+Expected<bool> FileSystem::tryLock(int descriptor, const std::string& path) {
+  while (flock(descriptor, LOCK_EX | LOCK_NB) != 0) {
+    if (errno == EWOULDBLOCK) return false;
+    if (errno != EINTR) return systemError("lock", path);
+  }
+  return true;
+}
+
 Status FileSystem::lock(int descriptor, const std::string& path, const LockPatience& patience) {
   const std::int64_t end = monotonicMilliseconds() + patience.milliseconds;
-  while (flock(descriptor, LOCK_EX | LOCK_NB) != 0) {
-    if (errno == EINTR) continue;
-    if (errno != EWOULDBLOCK) return systemError("lock", path);
+  while (true) {
+    const auto isLocked = tryLock(descriptor, path);
+    if (!isLocked) return isLocked.error();
+    if (*isLocked) return Done{};
     if (monotonicMilliseconds() > end) {
       const std::string held = patience.milliseconds == 0
                                    ? "has it locked; "
@@ -343,7 +366,6 @@ Status FileSystem::lock(int descriptor, const std::string& path, const LockPatie
     constexpr timespec kPause{0, 2'000'000};
     nanosleep(&kPause, nullptr);
   }
-  return Done{};
 }
 
 Status FileSystem::writeAll(int descriptor, ByteSpan bytes, const std::string& path) {

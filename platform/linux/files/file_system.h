@@ -143,6 +143,8 @@ class FileSystem {
   /// root can open it, so nobody else can lock it; in a folder that everybody may write to, the
   /// file must belong to a trusted user.
   Expected<Descriptor> lockFile(const std::string& path, const LockPatience& patience = {});
+  /// The same without waiting; nothing when another process has it locked.
+  Expected<std::optional<Descriptor>> lockFileIfFree(const std::string& path);
   /// The same with the file `.lock` of a folder, which must exist.
   Expected<Descriptor> lockFolder(const std::string& folder, const LockPatience& patience = {});
   /// Opens that file without locking it.
@@ -170,7 +172,10 @@ class FileSystem {
   friend class AppendedFile;
   friend class NewFile;
   Expected<Descriptor> openOrMake(const std::string& path, int flags, mode_t mode);
+  Expected<Descriptor> openLock(const std::string& path);
   Expected<Descriptor> keepFromOthers(Descriptor lock, const std::string& path);
+  /// Whether the lock was free.
+  Expected<bool> tryLock(int descriptor, const std::string& path);
   Status lock(int descriptor, const std::string& path, const LockPatience& patience);
   Status writeAll(int descriptor, ByteSpan bytes, const std::string& path);
   Status syncFolderOf(const std::string& path);

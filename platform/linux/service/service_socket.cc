@@ -4,7 +4,6 @@
 #include <cerrno>
 #include <cstring>
 #include <fcntl.h>
-#include <sys/file.h>
 #include <sys/stat.h>
 #include <unistd.h>
 
@@ -87,15 +86,9 @@ Expected<SocketAddress> SocketAddress::of(const std::string& path) {
 
 Expected<ServiceSocket> ServiceSocket::open(const DeviceRoot& root, std::string_view name) {
   const std::string path = serviceSocketPath(root, name);
-  FileSystem files;
-  if (const auto made = files.makeFolders(root.path(kServiceFolder)); !made) return made.error();
-
-  const std::string lockPath = serviceFile(root, name, ".lock");
-  Descriptor lock(
-      ::open(lockPath.c_str(), O_RDWR | O_CREAT | O_CLOEXEC | O_NOFOLLOW | O_NONBLOCK, 0600));
-  if (!lock) return systemError("open", lockPath);
-  if (flock(lock.get(), LOCK_EX | LOCK_NB) != 0) {
-    if (errno != EWOULDBLOCK) return systemError("lock", lockPath);
+  auto lock = FileSystem().lockFileIfFree(serviceFile(root, name, ".lock"));
+  if (!lock) return lock.error();
+  if (!*lock) {
     return Error{format("cannot listen at %s: another process listens there", path)};
   }
 
@@ -115,7 +108,7 @@ Expected<ServiceSocket> ServiceSocket::open(const DeviceRoot& root, std::string_
   result.path_ = path;
   result.device_ = status.st_dev;
   result.inode_ = status.st_ino;
-  result.lock_ = std::move(lock);
+  result.lock_ = **std::move(lock);
   return result;
 }
 
