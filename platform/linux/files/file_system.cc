@@ -53,6 +53,24 @@ Error cannotOpen(std::string_view what, const std::string& path) {
   return Error{"cannot use " + path + ": it is a symbolic link; move it away"};
 }
 
+// Gives a new version of `path` the owner and the mode of the former one, without permissions of
+// other users that `mode` does not grant.
+Status takeOwnerAndMode(int descriptor, const struct stat& fresh, const std::string& path,
+                        mode_t mode) {
+  const auto former = FileSystem::status(path);
+  if (!former || !S_ISREG(former->st_mode)) return Done{};
+  // Owner first: a change of owner clears the set-user bits of the mode.
+  if (former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) {
+    // Only root can do this; others own the new file.
+    [[maybe_unused]] const int code = fchown(descriptor, former->st_uid, former->st_gid);
+  }
+  const mode_t withheld = S_IRWXO & ~mode;
+  if (fchmod(descriptor, former->st_mode & 07777U & ~withheld) != 0) {
+    return systemError("set the mode of", path);
+  }
+  return Done{};
+}
+
 std::int64_t monotonicMilliseconds() {
   timespec now{};
   clock_gettime(CLOCK_MONOTONIC, &now);
@@ -171,41 +189,30 @@ bool FileSystem::isClosed(const std::string& path) {
 
 Expected<NewFile> FileSystem::create(const std::string& path, mode_t mode) {
   const std::string folder = folderOf(path);
+  std::string temporary;
+  Descriptor descriptor;
   bool foldersMade = false;
-  while (true) {
-    std::string temporary = folder + "/";
+  while (!descriptor) {
+    temporary = folder + "/";
     temporary += kTemporaryPrefix;
     temporary += randomName();
     temporary += kTemporarySuffix;
-    Descriptor descriptor(
-        openFile(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | kOpenSafely, mode));
-    if (!descriptor) {
-      if (errno == EEXIST) continue;
-      if (errno != ENOENT || foldersMade) return systemError("write", path);
-      if (Status made = makeFolders(folder); !made) return made.error();
-      foldersMade = true;
-      continue;
-    }
-
-    struct stat fresh {};
-    if (fstat(descriptor.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
-      removeStaleTemporaries(folder, fresh);
-    }
-    // Owner first: a change of owner clears the set-user bits of the mode.
-    const mode_t withheld = S_IRWXO & ~mode;
-    if (const auto former = status(path); former && S_ISREG(former->st_mode)) {
-      if ((former->st_uid != fresh.st_uid || former->st_gid != fresh.st_gid) &&
-          fchown(descriptor.get(), former->st_uid, former->st_gid) != 0) {
-        // Only root can do this; others own the new file.
-      }
-      if (fchmod(descriptor.get(), former->st_mode & 07777U & ~withheld) != 0) {
-        const Error error = systemError("set the mode of", path);
-        removeFile(temporary.c_str());
-        return error;
-      }
-    }
-    return NewFile(*this, path, std::move(temporary), std::move(descriptor));
+    descriptor =
+        Descriptor(openFile(temporary.c_str(), O_WRONLY | O_CREAT | O_EXCL | kOpenSafely, mode));
+    if (descriptor || errno == EEXIST) continue;
+    if (errno != ENOENT || foldersMade) return systemError("write", path);
+    if (Status made = makeFolders(folder); !made) return made.error();
+    foldersMade = true;
   }
+  NewFile file(*this, path, std::move(temporary), std::move(descriptor));
+
+  struct stat fresh {};
+  if (fstat(file.descriptor_.get(), &fresh) == 0 && tidiedFolders_.insert(folder).second) {
+    removeStaleTemporaries(folder, fresh);
+  }
+  const Status taken = takeOwnerAndMode(file.descriptor_.get(), fresh, path, mode);
+  if (!taken) return taken.error();
+  return file;
 }
 
 Status FileSystem::replace(const std::string& path, ByteSpan bytes, mode_t mode) {

@@ -56,13 +56,34 @@ class Sample {
     if (place < most_) chosen_[static_cast<std::size_t>(place)] = std::move(element);
   }
   std::vector<Element>& chosen() { return chosen_; }
-  std::uint64_t leftOut() const { return offered_ - chosen_.size(); }
+  std::uint64_t offered() const { return offered_; }
 
  private:
   std::size_t most_;
   std::uint64_t offered_ = 0;
   std::vector<Element> chosen_;
 };
+
+using NamesByOwner = std::map<std::uint32_t, Sample<std::string>>;
+
+// Draws the segments of a listing, and counts those of each owner that are left out.
+void choose(NamesByOwner& byOwner, std::minstd_rand& random, SegmentFolder::Listing& listing) {
+  Sample<SegmentEntry> all(limits::kSegments);
+  for (auto& [owner, names] : byOwner) {
+    for (std::string& name : names.chosen())
+      all.offer({std::move(name), owner}, random);
+  }
+  listing.segments = std::move(all.chosen());
+  std::map<std::uint32_t, std::uint64_t> chosen;
+  for (const SegmentEntry& entry : listing.segments)
+    ++chosen[entry.owner];
+  for (const auto& [owner, names] : byOwner) {
+    const std::uint64_t leftOut = names.offered() - chosen[owner];
+    if (leftOut > 0) listing.leftOut[owner] = leftOut;
+  }
+  std::sort(listing.segments.begin(), listing.segments.end(),
+            [](const SegmentEntry& a, const SegmentEntry& b) { return a.name < b.name; });
+}
 
 }  // namespace
 
@@ -98,7 +119,7 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
     }
   };
   std::minstd_rand random(std::random_device{}());
-  std::map<std::uint32_t, Sample<std::string>> byOwner;
+  NamesByOwner byOwner;
   std::size_t entries = 0;
   const int code = walkFolder(folder_, [&](const dirent& entry) {
     const std::string_view name = entry.d_name;
@@ -132,21 +153,7 @@ Expected<SegmentFolder::Listing> SegmentFolder::list(std::size_t mostFiles) cons
   });
   // What is not seen would pass for gone.
   if (code != 0) return systemError("list", path_, code);
-  Sample<SegmentEntry> all(limits::kSegments);
-  std::map<std::uint32_t, std::uint64_t> chosen;
-  for (auto& [owner, names] : byOwner) {
-    for (std::string& name : names.chosen())
-      all.offer({std::move(name), owner}, random);
-  }
-  listing.segments = std::move(all.chosen());
-  for (const SegmentEntry& entry : listing.segments)
-    ++chosen[entry.owner];
-  for (auto& [owner, names] : byOwner) {
-    const std::uint64_t offered = names.chosen().size() + names.leftOut();
-    if (offered > chosen[owner]) listing.leftOut[owner] = offered - chosen[owner];
-  }
-  std::sort(listing.segments.begin(), listing.segments.end(),
-            [](const SegmentEntry& a, const SegmentEntry& b) { return a.name < b.name; });
+  choose(byOwner, random, listing);
   return listing;
 }
 

@@ -1,6 +1,7 @@
 #include "platform/linux/live/live_machine.h"
 
 #include <algorithm>
+#include <array>
 #include <ctime>
 #include <optional>
 #include <span>
@@ -69,6 +70,38 @@ std::uint64_t nowInTicks() {
   clock_gettime(CLOCK_MONOTONIC, &now);
   return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000 +
          static_cast<std::uint64_t>(now.tv_nsec);
+}
+
+bool hasValue(const LiveChannel& channel, std::span<const std::int64_t> values) {
+  const auto isUnset = [](std::int64_t value) { return value == kUnset; };
+  // With one unknown residency, the shares of all states would be wrong.
+  if (channel.format == ChannelFormat::State)
+    return std::ranges::none_of(values.subspan(channel.elements), isUnset);
+  return !std::ranges::all_of(values, isUnset);
+}
+
+using ElementValues = std::array<std::int64_t, kElementValues>;
+
+// `values` are the entry counts of all states, followed by their residencies.
+ElementValues stateValues(std::uint64_t id, std::span<const std::int64_t> values,
+                          std::size_t state) {
+  return {static_cast<std::int64_t>(id), values[state], values[values.size() / 2 + state]};
+}
+
+// The last element of an array may have room for more values than are left.
+ElementValues numberValues(ChannelFormat format, std::span<const std::int64_t> values,
+                           std::size_t element) {
+  ElementValues result;
+  result.fill(format == ChannelFormat::SimpleArray ? kUnset : 0);
+  const auto rest = values.subspan(element * kElementValues);
+  std::copy_n(rest.begin(), std::min(rest.size(), kElementValues), result.begin());
+  return result;
+}
+
+void storeValues(MutableByteSpan record, const ElementValues& values) {
+  for (std::size_t i = 0; i < values.size(); ++i) {
+    storeLittle64(record, kElementFirstValue + 8 * i, static_cast<std::uint64_t>(values[i]));
+  }
 }
 
 }  // namespace
@@ -204,41 +237,24 @@ class LiveMachine::Sampling final : public LiveSampling {
     const LiveChannel& channel = *places_[index].channel;
     const LiveSource& source = state_->sources()[places_[index].source];
     const auto values = source.slots().subspan(channel.firstSlot, channel.slots);
-    // With one unknown residency, the shares of all states would be wrong.
-    if (channel.format == ChannelFormat::State &&
-        std::ranges::count(values.subspan(channel.elements), kUnset) > 0) {
-      return 0;
-    }
-    bool hasValue = channel.format == ChannelFormat::State;
+    if (!hasValue(channel, values)) return 0;
     for (std::size_t element = 0; element < channel.elements; ++element) {
       const MutableByteSpan record = room.subspan(element * kElementBytes, kElementBytes);
       storeLittle64(record, kElementDriver, source.driverID());
       storeLittle64(record, kElementChannel, channel.id);
       storeLittle64(record, kElementType, channel.type());
-      storeLittle64(record, kElementTimestamp, ticks_);
-      const auto store = [&](std::size_t value, std::int64_t number) {
-        storeLittle64(record, kElementFirstValue + 8 * value, static_cast<std::uint64_t>(number));
-      };
-      for (std::size_t value = 0; value < kElementValues; ++value)
-        store(value, channel.format == ChannelFormat::SimpleArray ? kUnset : 0);
       if (channel.format == ChannelFormat::State) {
         const Residency& states = source.residency(channel);
         const bool isCurrent = states.currentSlot < source.slots().size() &&
                                source.slots()[states.currentSlot] == states.numbers[element];
-        store(0, static_cast<std::int64_t>(states.ids[element]));
-        store(1, values[element]);
-        store(2, values[channel.elements + element]);
         storeLittle64(record, kElementTimestamp, isCurrent ? ticks_ : 0);
-        continue;
-      }
-      for (std::size_t value = 0; value < kElementValues; ++value) {
-        const std::size_t at = element * kElementValues + value;
-        if (at >= values.size()) break;
-        store(value, values[at]);
-        hasValue = hasValue || values[at] != kUnset;
+        storeValues(record, stateValues(states.ids[element], values, element));
+      } else {
+        storeLittle64(record, kElementTimestamp, ticks_);
+        storeValues(record, numberValues(channel.format, values, element));
       }
     }
-    return hasValue ? std::size_t{channel.elements} * kElementBytes : 0;
+    return std::size_t{channel.elements} * kElementBytes;
   }
 
  private:
