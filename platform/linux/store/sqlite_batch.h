@@ -90,16 +90,8 @@ class SqliteBatch {
   };
   const std::optional<Damage>& damage() const { return damage_; }
 
-  /// Makes other writers wait, updates the store's schema and takes in kept values. This and the
-  /// following are for use inside the store only: they throw `StoreFailure`.
-  void begin();
-  /// As `setScalar` and `commit`.
-  void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
-  void finish();
-  /// Hands over the connection once the batch is finished.
-  SqliteConnection release();
-
  private:
+  friend class SqliteStore;
   struct Statements;
 
   // A scalar that waits to be written; its key is in `scalarKeys_`.
@@ -109,6 +101,16 @@ class SqliteBatch {
     std::size_t keyStart;
     std::int64_t value;
   };
+
+  // For the store, which handles the `StoreFailure` that these four throw.
+
+  /// Makes other writers wait, updates the store's schema and takes in kept values.
+  void begin();
+  /// As `setScalar` and `commit`.
+  void putScalar(std::int32_t day, std::string_view key, std::int64_t value);
+  void finish();
+  /// Hands over the connection once the batch is finished.
+  SqliteConnection release();
 
   void takeKeptValues();
   void setDamagedValuesAside();
