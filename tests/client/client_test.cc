@@ -65,11 +65,11 @@ TEST_F(Recording, AChildRecordsIntoASegmentOfItsOwn) {
   });
   const auto both = segments();
   ASSERT_EQ(both.size(), 2U);
-  EXPECT_EQ(writerOf(both[0]), SegmentWriter::Gone);  // although the child lives
-  EXPECT_EQ(writerOf(both[1]), SegmentWriter::Present);
+  EXPECT_EQ(writerOf(both[0]), WriterPresence::Gone);  // although the child lives
+  EXPECT_EQ(writerOf(both[1]), WriterPresence::Present);
   const Descriptor file(open(both[1].c_str(), O_RDONLY));
   kill(static_cast<pid_t>(SegmentFile(file.get()).facts().pid), SIGKILL);
-  while (writerOf(both[1]) == SegmentWriter::Present) {
+  while (writerOf(both[1]) == WriterPresence::Present) {
   }
   fold();
   EXPECT_EQ(scalar("count"), 11);
@@ -87,7 +87,7 @@ TEST_F(Recording, AChildWithoutValuesHoldsNoSegment) {
       forked.wait();
     }
   });
-  EXPECT_EQ(writerOf(segments().at(0)), SegmentWriter::Gone);
+  EXPECT_EQ(writerOf(segments().at(0)), WriterPresence::Gone);
   seen.open();
 }
 
@@ -550,8 +550,8 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
   const Descriptor file(open(segment.c_str(), O_RDONLY));
   SegmentFacts facts = SegmentFile(file.get()).facts();
   EXPECT_EQ(facts.pid, static_cast<std::uint32_t>(child));
-  EXPECT_EQ(writerOf(segment), SegmentWriter::Present);
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Present);
+  EXPECT_EQ(writerOf(segment), WriterPresence::Present);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Present);
   run([&] {  // as another user, from whom /proc hides the process; if root may mount
     if (unshare(CLONE_NEWNS) != 0 ||
         mount("none", "/", nullptr, MS_REC | MS_PRIVATE, nullptr) != 0 ||
@@ -560,19 +560,19 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
       return;
     }
     EXPECT_EQ(access(("/proc/" + std::to_string(child)).c_str(), F_OK), -1);
-    EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Unknown);
+    EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Unknown);
   });
   kill(child, SIGCONT);
   executed.wait();
-  EXPECT_EQ(writerOf(segment), SegmentWriter::Gone);
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Present) << "it runs another program";
+  EXPECT_EQ(writerOf(segment), WriterPresence::Gone);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Present) << "it runs another program";
   waitFor(child, SIGKILL);
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Gone);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Gone);
 
   facts.pid = 1;  // used by another process
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Gone);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Gone);
   ++facts.pidNamespace;
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Unknown);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Unknown);
 }
 
 TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
@@ -591,8 +591,8 @@ TEST_F(Recording, AWriterInAnotherPidNamespaceIsSeen) {
   const Descriptor file(open(segment.c_str(), O_RDONLY));
   const SegmentFacts facts = SegmentFile(file.get()).facts();
   EXPECT_EQ(facts.pid, 1U);
-  EXPECT_EQ(findSegmentProcess(facts), SegmentWriter::Unknown);
-  EXPECT_EQ(writerOf(segment), SegmentWriter::Present);
+  EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Unknown);
+  EXPECT_EQ(writerOf(segment), WriterPresence::Present);
   fold();
   EXPECT_EQ(scalar("count"), 7);
   EXPECT_EQ(segments().size(), 1U);

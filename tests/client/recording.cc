@@ -144,7 +144,7 @@ std::vector<std::string> Recording::segments() const {
   return paths;
 }
 
-SegmentWriter Recording::writerOf(const std::string& segment) const {
+WriterPresence Recording::writerOf(const std::string& segment) const {
   const Descriptor file(open(segment.c_str(), O_RDONLY));
   return findSegmentWriter(file.get(), SegmentFile(file.get()).facts());
 }
@@ -155,7 +155,7 @@ void Recording::fold() {
     // When threads begin a segment at the same time, only one keeps its own.
     if (!file && errno == ENOENT) continue;
     SegmentReader reader(file.get());
-    const bool isGone = findSegmentWriter(file.get(), reader.facts()) == SegmentWriter::Gone;
+    const bool isGone = findSegmentWriter(file.get(), reader.facts()) == WriterPresence::Gone;
     const auto state = reader.state();
     ASSERT_TRUE(state) << state.error().message;
     SegmentProgress progress;

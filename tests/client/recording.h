@@ -21,7 +21,7 @@
 #include "client/segment_format.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/segments/segment_reader.h"
-#include "platform/linux/segments/segment_writer.h"
+#include "platform/linux/segments/writer_presence.h"
 
 namespace tavrel {
 
@@ -134,7 +134,7 @@ class Recording : public testing::Test, public SegmentSink {
   std::vector<std::string> segments() const;
   /// Reads on in all segments, with encoded positions; acknowledges, and removes what is done.
   void fold();
-  SegmentWriter writerOf(const std::string& segment) const;
+  WriterPresence writerOf(const std::string& segment) const;
 
   /// Adds 1 and records a number, in all threads at the same time: all numbers from `first` up.
   static void recordInThreads(int threads, int perThread, int first = 0);

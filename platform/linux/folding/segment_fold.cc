@@ -17,7 +17,7 @@
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/folding/segment_intake.h"
 #include "platform/linux/limits/device_limits.h"
-#include "platform/linux/segments/segment_writer.h"
+#include "platform/linux/segments/writer_presence.h"
 
 namespace tavrel {
 namespace {
@@ -185,7 +185,7 @@ Status FoldRun::take(SqliteBatch& batch, const SegmentEntry& entry) {
   SegmentReader reader(segment.file.get());
   // Ask first: only what is read after the last writer has gone is complete.
   const bool isWriterGone =
-      findSegmentWriter(segment.file.get(), reader.facts()) == SegmentWriter::Gone;
+      findSegmentWriter(segment.file.get(), reader.facts()) == WriterPresence::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state) {

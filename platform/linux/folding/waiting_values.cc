@@ -8,7 +8,7 @@
 #include "base/bytes.h"
 #include "base/limits.h"
 #include "platform/linux/files/system_error.h"
-#include "platform/linux/segments/segment_writer.h"
+#include "platform/linux/segments/writer_presence.h"
 
 namespace tavrel {
 namespace {
@@ -89,7 +89,7 @@ Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders
                           PendingDistributions& buffer) {
   SegmentReader reader(segment.file.get());
   // No lease here: it could disturb a fold.
-  const bool isWriterGone = findSegmentProcess(reader.facts()) == SegmentWriter::Gone;
+  const bool isWriterGone = findSegmentProcess(reader.facts()) == WriterPresence::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state || *state != SegmentReader::State::Begun) return Done{};

@@ -4,7 +4,7 @@
 //   SegmentReader reader(descriptor);
 //   Expected<SegmentReader::State> state = reader.state();
 //   if (state && *state == SegmentReader::State::Begun)
-//     progress = reader.read(position, dating, writerIsGone, sink);   // moves `position`
+//     progress = reader.read(position, boot, writerIsGone, sink);   // moves `position`
 //   ... the store takes the values and `position` in one transaction ...
 //   acknowledge(writableDescriptor, progress);  // the process may use that space again
 //
@@ -95,7 +95,7 @@ class SegmentReader {
   std::size_t positionBytes() const;
 
   /// Passes the values after `position` to `sink`, and advances it. `writerIsGone` is what
-  /// `segment_writer.h` found before the call: if true, records after an unfinished one are read
+  /// `writer_presence.h` found before the call: if true, records after an unfinished one are read
   /// too.
   SegmentProgress read(SegmentPosition& position, BootInstant boot, bool writerIsGone,
                        SegmentSink& sink);

@@ -5,7 +5,7 @@
 
 namespace tavrel {
 
-enum class SegmentWriter : unsigned char {
+enum class WriterPresence : unsigned char {
   Gone,     // for good: only the process that creates a segment opens it for writing
   Present,  // also when this process has it open for writing
   Unknown,  // keep the segment
@@ -14,9 +14,9 @@ enum class SegmentWriter : unsigned char {
 /// Asks the kernel for a lease, which it refuses while any process has the file open or mapped for
 /// writing. Needs the file's owner or CAP_LEASE, and a read-only descriptor. When leases do not
 /// work, looks for the process that `facts` names.
-SegmentWriter findSegmentWriter(int readOnlyDescriptor, const SegmentFacts& facts);
+WriterPresence findSegmentWriter(int readOnlyDescriptor, const SegmentFacts& facts);
 
 /// Only looks for the process.
-SegmentWriter findSegmentProcess(const SegmentFacts& facts);
+WriterPresence findSegmentProcess(const SegmentFacts& facts);
 
 }  // namespace tavrel

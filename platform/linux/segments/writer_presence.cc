@@ -1,4 +1,4 @@
-#include "platform/linux/segments/segment_writer.h"
+#include "platform/linux/segments/writer_presence.h"
 
 #include <cerrno>
 #include <csignal>
@@ -36,34 +36,34 @@ bool exists(std::uint32_t pid) {
 
 }  // namespace
 
-SegmentWriter findSegmentProcess(const SegmentFacts& facts) {
+WriterPresence findSegmentProcess(const SegmentFacts& facts) {
   struct stat own {};
   if (facts.pid == 0 || facts.processStart == 0 || facts.pidNamespace == 0 ||
       stat("/proc/self/ns/pid", &own) != 0 || own.st_ino != facts.pidNamespace) {
-    return SegmentWriter::Unknown;
+    return WriterPresence::Unknown;
   }
   std::uint64_t start = 0;
   switch (startOf(facts.pid, start)) {
     case Lookup::Found:
-      return start == facts.processStart ? SegmentWriter::Present : SegmentWriter::Gone;
+      return start == facts.processStart ? WriterPresence::Present : WriterPresence::Gone;
     case Lookup::Absent:
-      if (!exists(facts.pid)) return SegmentWriter::Gone;
+      if (!exists(facts.pid)) return WriterPresence::Gone;
       break;
     case Lookup::Failed:
       break;
   }
-  return SegmentWriter::Unknown;
+  return WriterPresence::Unknown;
 }
 
-SegmentWriter findSegmentWriter(int descriptor, const SegmentFacts& facts) {
+WriterPresence findSegmentWriter(int descriptor, const SegmentFacts& facts) {
   // If somebody opens the file for writing during the lease, the kernel sends SIGURG, which is
   // ignored by default, instead of SIGIO, which would end the process.
   if (fcntl(descriptor, F_SETSIG, SIGURG) == 0) {
     if (fcntl(descriptor, F_SETLEASE, F_RDLCK) == 0) {
       fcntl(descriptor, F_SETLEASE, F_UNLCK);
-      return SegmentWriter::Gone;
+      return WriterPresence::Gone;
     }
-    if (errno == EAGAIN) return SegmentWriter::Present;
+    if (errno == EAGAIN) return WriterPresence::Present;
   }
   return findSegmentProcess(facts);
 }
