@@ -2,8 +2,8 @@
 //
 //   PendingDistributions pending;
 //   pending.append(pending.series(day, key), value, secondsInDay);
-//   pending.each([&](std::int32_t day, std::string_view key, const DistributionBlock& block) { ...
-//   }); pending.clear();
+//   pending.each(take);  // take(day, key, block) for each row
+//   pending.clear();
 #pragma once
 
 #include <cstddef>
