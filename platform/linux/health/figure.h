@@ -11,14 +11,15 @@
 #include <string_view>
 #include <vector>
 
+#include "platform/report_units.h"
+
 namespace tavrel::health {
 
-/// Unit codes, as in report channels: the quantity in the top byte, the scale below.
-using Unit = std::uint64_t;
-inline constexpr Unit kPlain = 0;  // percentages, states, hours: the name says which
-inline constexpr Unit kBytes = 0x0900820000000000;
-inline constexpr Unit kMillidegrees = 0x0A00007C00000000;
-inline constexpr Unit kEvents = 0x6400000000000000;
+using units::kBytes;
+using units::kEvents;
+using units::kMillidegrees;
+using units::kPlain;  // percentages, states, hours: the name says which
+using units::Unit;
 
 enum class DriveKind : std::uint8_t { Nvme, Emmc, Ufs, Ata, Mtd, Ubi };
 std::string_view nameOf(DriveKind kind);

@@ -21,9 +21,11 @@
 #include "base/plist.h"
 #include "platform/linux/live/kernel_file.h"
 #include "platform/linux/live/kernel_text.h"
-#include "platform/linux/live/live_units.h"
+#include "platform/report_units.h"
 
 namespace tavrel::live {
+
+using namespace units;
 
 inline constexpr std::uint16_t kToolCategory = 0x0001;
 inline constexpr std::uint16_t kDailyCategory = 0x0100;

@@ -1,10 +1,12 @@
-// Unit codes of live figures. Labels match whole codes, so figures are converted to one of these:
-// no unit of 10 ms or of 512 bytes has a label.
+// Unit codes of report channels and of the health figures of drives, which such channels show.
+//
+// Labels match whole codes, so figures are converted to one of these: no unit of 10 ms or of 512
+// bytes has a label.
 #pragma once
 
 #include <cstdint>
 
-namespace tavrel::live {
+namespace tavrel::units {
 
 using Unit = std::uint64_t;
 
@@ -13,7 +15,7 @@ constexpr Unit unitCode(std::uint64_t quantity, std::uint64_t scale) {
   return quantity << 56 | scale << 32;
 }
 
-inline constexpr Unit kPlain = 0;  // no unit: percentages, states, revolutions per minute
+inline constexpr Unit kPlain = 0;  // no unit: percentages, states, hours, revolutions per minute
 inline constexpr Unit kSeconds = unitCode(1, 0);
 inline constexpr Unit kMilliseconds = unitCode(1, 0x7C);
 inline constexpr Unit kMicroseconds = unitCode(1, 0x79);
@@ -31,4 +33,4 @@ inline constexpr Unit kMillidegrees = unitCode(10, 0x7C);
 inline constexpr Unit kEvents = unitCode(100, 0);
 inline constexpr Unit kPackets = unitCode(101, 0);
 
-}  // namespace tavrel::live
+}  // namespace tavrel::units
