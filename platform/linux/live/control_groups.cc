@@ -77,7 +77,7 @@ class IoReader final : public TextReader {
         isDevice = disks_->contains(word);
         continue;
       }
-      const auto value = parseNumber(word.substr(equals + 1));
+      const auto value = parseKernelNumber(word.substr(equals + 1));
       if (!isDevice || !value) continue;
       for (std::size_t i = 0; i < kIo.size(); ++i) {
         if (kIo[i].key != word.substr(0, equals)) continue;

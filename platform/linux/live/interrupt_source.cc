@@ -29,7 +29,7 @@ std::vector<std::uint32_t> processorsIn(std::string_view heading) {
   std::vector<std::uint32_t> numbers;
   for (auto word = takeWord(heading); !word.empty(); word = takeWord(heading)) {
     if (!word.starts_with("CPU")) return {};
-    const auto number = parseNumber(word.substr(3));
+    const auto number = parseKernelNumber(word.substr(3));
     if (!number || *number < 0) return {};
     if (static_cast<std::uint64_t>(*number) >= limits::kLiveProcessors) return {};
     numbers.push_back(static_cast<std::uint32_t>(*number));
@@ -75,7 +75,7 @@ class InterruptReader final : public TextReader {
       const auto row = rows_.find(keyOf(line));
       if (row == rows_.end()) continue;
       for (const std::uint32_t processor : processors) {
-        const auto count = parseNumber(takeWord(line));
+        const auto count = parseKernelNumber(takeWord(line));
         if (!count) break;
         const std::size_t slot = std::size_t{row->second} + processor;
         if (processor >= processors_ || slot >= slots.size()) continue;
@@ -110,11 +110,11 @@ void addCounts(const std::string& path, const std::string& prefix, std::string_v
     std::string_view rest = line;
     for (std::size_t i = 0; i < processors.size(); ++i) {
       std::string_view ahead = rest;
-      if (!parseNumber(takeWord(ahead))) break;
+      if (!parseKernelNumber(takeWord(ahead))) break;
       rest = ahead;
     }
     // Numbers of interrupts change from boot to boot, handlers do not.
-    std::string name = parseNumber(key) ? handlersIn(rest) : key;
+    std::string name = parseKernelNumber(key) ? handlersIn(rest) : key;
     if (name.empty()) name = key;
     name = prefix + channelName(name);
     const auto [at, isNew] = slots.emplace(name, static_cast<std::uint32_t>(slots.size()) * width);

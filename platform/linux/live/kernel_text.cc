@@ -40,7 +40,7 @@ std::uint64_t wordOf(std::string_view name) {
 
 }  // namespace
 
-std::optional<std::int64_t> parseNumber(std::string_view text) {
+std::optional<std::int64_t> parseKernelNumber(std::string_view text) {
   while (!text.empty() && isBlank(text.front()))
     text.remove_prefix(1);
   while (!text.empty() && isBlank(text.back()))
@@ -63,7 +63,7 @@ std::optional<std::int64_t> parseNumber(std::string_view text) {
 }
 
 std::int64_t scaledNumber(std::string_view text, Scale scale) {
-  const auto number = parseNumber(text);
+  const auto number = parseKernelNumber(text);
   if (!number) return kUnset;
   std::int64_t product = 0;
   if (__builtin_mul_overflow(*number, scale.multiply, &product)) {

@@ -23,9 +23,9 @@ struct Scale {
 
 /// A number in decimal or, with 0x, hexadecimal; surrounding blanks and decimal places are ignored.
 /// Nothing for other text. Numbers that do not fit 64 signed bits become the largest one.
-std::optional<std::int64_t> parseNumber(std::string_view text);
+std::optional<std::int64_t> parseKernelNumber(std::string_view text);
 
-/// `parseNumber` in the channel's unit; `kUnset` when it is not a number.
+/// `parseKernelNumber` in the channel's unit; `kUnset` when it is not a number.
 std::int64_t scaledNumber(std::string_view text, Scale scale);
 
 /// The sum of two values, neither of them `kUnset`, limited to the largest number.

@@ -26,7 +26,7 @@ std::vector<std::string> numberedRows(const std::string& path, const TableForm& 
   while (text && !text->empty() && keys.size() < limits::kLiveElements) {
     std::string_view line = takeLine(*text);
     const std::string_view key = keyOfLine(line, form);
-    if (parseNumber(key)) keys.emplace_back(key);
+    if (parseKernelNumber(key)) keys.emplace_back(key);
   }
   return keys;
 }
@@ -60,8 +60,8 @@ class TransitionReader final : public TextReader {
       if (line.starts_with(':')) line.remove_prefix(1);
       const bool hasFields = hasTimes_ && tokensIn(line, form_) <= states_.size();
       const auto add = [&](std::int64_t& sum, bool isLast) {
-        const auto number =
-            parseNumber(hasFields ? takeField(line, isLast) : takeToken(line, form_.separator));
+        const auto number = parseKernelNumber(hasFields ? takeField(line, isLast)
+                                                        : takeToken(line, form_.separator));
         if (number) sum = saturatingSum(sum, *number);
         return number.has_value();
       };
@@ -107,7 +107,7 @@ void addStateTable(const StateTable& table, const Place& place, const std::strin
   Residency residency;
   std::vector<std::string> names;
   for (const std::string& state : states) {
-    residency.numbers.push_back(*parseNumber(state));
+    residency.numbers.push_back(*parseKernelNumber(state));
     names.push_back(table.nameOf(residency.numbers.back()));
   }
   residency.ids = stateIDs(names);
