@@ -5,13 +5,13 @@
 #include <string>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/platform.h"
 #include "platform/plist/coding.h"
 #include "tools/log/log_preview.h"
 #include "tools/page/sections.h"
-#include "tools/report/report_selection.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/output_file.h"
 
@@ -79,7 +79,7 @@ void makePage(ToolContext& context, const Arguments& arguments) {
 }
 
 std::string faultOfDays(const std::string& text) {
-  const auto days = parseWord(text);
+  const auto days = parseNumber<std::uint32_t>(text);
   if (days && *days >= 1 && *days <= kMostDays) return {};
   return format("takes 1 to %u, not %s", kMostDays, text);
 }

@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "base/parse_number.h"
 #include "ioreport/keys.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/linux_platform.h"
@@ -27,7 +28,7 @@
 namespace tavrel {
 namespace {
 
-constexpr std::uint64_t kMostSeconds = 3600;
+constexpr std::uint32_t kMostSeconds = 3600;
 
 struct Arguments {
   std::string id;
@@ -161,9 +162,9 @@ void record(ToolContext& context, const Arguments& arguments) {
 }
 
 std::string secondsFault(const std::string& text) {
-  const auto seconds = parseWord(text);
+  const auto seconds = parseNumber<std::uint32_t>(text);
   if (seconds && *seconds <= kMostSeconds) return {};
-  return format("not a number of seconds: %s: give 0 to %llu", text, kMostSeconds);
+  return format("not a number of seconds: %s: give 0 to %u", text, kMostSeconds);
 }
 
 }  // namespace

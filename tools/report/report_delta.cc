@@ -7,6 +7,7 @@
 
 #include "base/format.h"
 #include "ioreport/ioreport.h"
+#include "tools/report/report_failure.h"
 #include "tools/report/report_selection.h"
 
 namespace tavrel {

@@ -8,6 +8,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording_folder.h"
+#include "tools/report/report_failure.h"
 
 namespace tavrel {
 namespace {

@@ -6,7 +6,7 @@
 
 #include "base/format.h"
 #include "base/parse_number.h"
-#include "tools/shared/table.h"
+#include "tools/report/report_failure.h"
 
 namespace tavrel {
 namespace {
@@ -147,22 +147,6 @@ std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate) {
     return kIterateContinue;
   });
   return channels;
-}
-
-std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error) {
-  // The library gives a failure without a reason of its own the standard reason of its code.
-  if (!error || error->failureReason == createCFErr(error->code, nullptr)->failureReason) {
-    return std::nullopt;
-  }
-  return error->failureReason.value_or(error->description());
-}
-
-std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
-                          std::string_view advice) {
-  std::string line = "cannot " + std::string(what);
-  if (const auto reason = reasonOf(error)) line += ": " + printable(*reason);
-  if (error) line += format(" (%#x)", error->code);
-  return line + ": " + std::string(advice);
 }
 
 std::string formatName(std::uint8_t format) {

@@ -1,4 +1,4 @@
-// Selects the report channels of a command.
+// Selects the report channels of a command, lists them and names their formats.
 #pragma once
 
 #include <cstdint>
@@ -42,16 +42,6 @@ void keepOrigin(const plist::Dictionary& channels, const ReportSelection& select
 
 /// All channels of an aggregate, in order.
 std::vector<plist::Dictionary> channelsIn(const plist::Dictionary& aggregate);
-
-inline constexpr std::string_view kLookAtDrivers =
-    "'tavrelctl registry list' shows the drivers and the hub";
-
-/// The reason that an error gives beyond its code.
-std::optional<std::string> reasonOf(const std::optional<ErrorObject>& error);
-
-/// "cannot WHAT: REASON (0xE00002F0): ADVICE", without the parts that are unknown.
-std::string reportFailure(std::string_view what, const std::optional<ErrorObject>& error,
-                          std::string_view advice = kLookAtDrivers);
 
 /// "simple", "state", "histogram", "array", "unknown", or the number of any other format.
 std::string formatName(std::uint8_t format);
