@@ -61,6 +61,19 @@ Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
   return latest;
 }
 
+/// The day that `--from` names.
+Expected<std::int32_t> namedDay(const std::string& text, std::int32_t today) {
+  auto day = parseDay(text, today);
+  if (!day) return day;
+  if (*day < 0) {
+    return Error{format("day %s is before 1970: give a number of days since then", dayText(*day))};
+  }
+  if (*day > kLastFirstDay) {
+    return Error{format("day %d never comes: give at most %d", *day, kLastFirstDay)};
+  }
+  return day;
+}
+
 /// The first day of a permission that is given now: a day for which nothing has been recorded yet,
 /// even if the clock was or is wrong.
 Expected<std::int32_t> firstDayFromNow(ToolContext& context, std::int32_t today) {
@@ -113,6 +126,19 @@ void printAlreadyAllowed(ToolContext& context, const SubmissionPermission& permi
   }
 }
 
+/// Mentions a first day that covers what is already recorded, or one that a wrong clock has put
+/// off.
+void noteFirstDay(ToolContext& context, std::int32_t first, bool isNamed, std::int32_t today) {
+  if (first <= today) {
+    context.note(format("this includes what is already recorded, from day %s on", dayText(first)));
+  } else if (!isNamed && first - 1 > today) {
+    context.note(
+        format("day %s is recorded already, though today is %s: submission begins after "
+               "it; give --from DAY if a wrong clock recorded it",
+               dayText(first - 1), dayText(today)));
+  }
+}
+
 /// Mentions what else the first log needs.
 void noteMissingWhitelist(ToolContext& context) {
   const WhitelistState whitelist = whitelistState(context);
@@ -124,19 +150,13 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   if (!stored) return context.fail(stored.error().message);
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
   const bool isNamed = !arguments.from.empty();
-  auto first = parseDay(arguments.from, today);
-  if (isNamed && !first) return context.failUsage(first.error().message);
-  if (isNamed && *first < 0) {
-    return context.failUsage(
-        format("day %s is before 1970: give a number of days since then", dayText(*first)));
-  }
-  if (isNamed && *first > kLastFirstDay) {
-    return context.failUsage(format("day %d never comes: give at most %d", *first, kLastFirstDay));
-  }
   if (!isNamed && stored->isGiven && !stored->firstDay)
     return printAlreadyAllowed(context, *stored, today);
-  if (!isNamed) first = firstDayFromNow(context, today);
-  if (!first) return context.fail(first.error().message);
+  const auto first = isNamed ? namedDay(arguments.from, today) : firstDayFromNow(context, today);
+  if (!first) {
+    const std::string& fault = first.error().message;
+    return isNamed ? context.failUsage(fault) : context.fail(fault);
+  }
 
   // Waiting logs were permitted; a later first day would partly withdraw that permission.
   if (stored->isGiven && (!stored->firstDay || *first > *stored->firstDay)) {
@@ -160,14 +180,7 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
                : context.fail("the permission was changed at the same moment: run it again");
   }
   printAllowed(context, permission, true);
-  if (*first <= today) {
-    context.note(format("this includes what is already recorded, from day %s on", dayText(*first)));
-  } else if (!isNamed && *first - 1 > today) {
-    context.note(
-        format("day %s is recorded already, though today is %s: submission begins after "
-               "it; give --from DAY if a wrong clock recorded it",
-               dayText(*first - 1), dayText(today)));
-  }
+  noteFirstDay(context, *first, isNamed, today);
   noteMissingWhitelist(context);
 }
 
