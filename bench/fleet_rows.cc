@@ -116,7 +116,7 @@ class Logs {
 
 void append(const char* where, std::size_t count, std::size_t atOnce, Logs logs) {
   Watch watch;
-  const auto engine = openEngine(where, OpenMode::kWrite);
+  const auto engine = openEngine(where, OpenMode::Write);
   std::size_t added = 0;
   for (std::size_t first = 0; first < count; first += atOnce) {
     std::vector<LogRecord> records;
@@ -193,7 +193,7 @@ void insertRows(const char* path, std::size_t count, std::size_t atOnce) {
 void scan(const char* where, std::size_t readers) {
   Watch watch;
   watch.start();
-  const auto engine = openEngine(where, OpenMode::kRead);
+  const auto engine = openEngine(where, OpenMode::Read);
   const std::vector<Key> keys = engine->keys();
   std::atomic<std::size_t> next = 0;
   std::atomic<std::size_t> rows = 0;
@@ -206,14 +206,14 @@ void scan(const char* where, std::size_t readers) {
         std::size_t ownRows = 0;
         std::int64_t ownSum = 0;
         for (std::size_t i = next++; i < keys.size(); i = next++) {
-          if (keys[i].kind == KeyKind::kScalar) {
+          if (keys[i].kind == KeyKind::Scalar) {
             own->scalars(keys[i].name, [&](std::span<const ScalarValue> values) {
               ownRows += values.size();
               for (const ScalarValue& value : values)
                 ownSum += value.value;
             });
           }
-          if (keys[i].kind == KeyKind::kDistribution) {
+          if (keys[i].kind == KeyKind::Distribution) {
             own->distributions(keys[i].name, [&](std::span<const DistributionValue> values) {
               ownRows += values.size();
             });
@@ -230,14 +230,14 @@ void scan(const char* where, std::size_t readers) {
 
 std::string firstDistribution(Engine& engine) {
   for (const Key& key : engine.keys())
-    if (key.kind == KeyKind::kDistribution) return key.name;
+    if (key.kind == KeyKind::Distribution) return key.name;
   return {};
 }
 
 // Merges as `show` does, without reading the table of logs. All results must have equal bits.
 void merge(const char* where, std::size_t times) {
   Watch watch;
-  const auto engine = openEngine(where, OpenMode::kRead);
+  const auto engine = openEngine(where, OpenMode::Read);
   const std::string key = firstDistribution(*engine);
   double mean = 0;
   for (std::size_t i = 0; i < times; ++i) {
@@ -264,7 +264,7 @@ constexpr const char* kOwnMerge =
 
 void askServer(const char* where, std::size_t times, const std::string& columns) {
   Watch watch;
-  const std::string key = firstDistribution(*openEngine(where, OpenMode::kRead));
+  const std::string key = firstDistribution(*openEngine(where, OpenMode::Read));
   Server server(readServerAddress(where));
   server.use(server.address().database);
   const std::string statement =

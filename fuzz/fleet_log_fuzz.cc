@@ -29,12 +29,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   LogRecord plain;
   LogBuilder plainBuilder(plain);
   const PlainXml outcome = readPlainXml(asText(bytes), plainBuilder);
-  if (outcome == PlainXml::kNotPlain) return 0;
+  if (outcome == PlainXml::NotPlain) return 0;
   LogRecord whole;
   LogBuilder wholeBuilder(whole);
   static ExpatXml xml;
   const std::string fault = xml.read(bytes, wholeBuilder);
-  if (outcome == PlainXml::kRefused) {
+  if (outcome == PlainXml::Refused) {
     if (fault != plainBuilder.fault()) std::abort();
     return 0;
   }

@@ -52,11 +52,11 @@ void read(const fuzz::Tree& tree, const std::string& name, const UploadLines& li
     if (found.metadata) checkTexts(*found.metadata);
     const ReadItem item = readItem(std::move(found), reader, permitted);
     switch (item.source.kind) {
-      case SourceItem::Kind::kRefused:
-      case SourceItem::Kind::kSkipped:
+      case SourceItem::Kind::Refused:
+      case SourceItem::Kind::Skipped:
         return require(!item.record && !item.source.reason.empty());
-      case SourceItem::Kind::kOther:
-      case SourceItem::Kind::kTooNew:
+      case SourceItem::Kind::Other:
+      case SourceItem::Kind::TooNew:
         return require(!item.record);
       default:
         require(item.record && item.bytes <= fleet::limits::kLogBytes);

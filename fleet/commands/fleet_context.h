@@ -4,7 +4,7 @@
 //     const Command show = top.addCommand("show", "Show one statistic");
 //     ...
 //     show.onRun([&context, options] {
-//       const auto engine = context.openDatabase(OpenMode::kRead);
+//       const auto engine = context.openDatabase(OpenMode::Read);
 //       ...
 //     });
 //   }

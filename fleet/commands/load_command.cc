@@ -75,7 +75,7 @@ void load(FleetContext& context, const LoadOptions& options) {
         return context.fail(systemError("read", path).message + ": check the path");
     }
   }
-  const auto engine = context.openDatabase(OpenMode::kWrite);
+  const auto engine = context.openDatabase(OpenMode::Write);
   LoadRequest request = options.request;
   if (!options.setAside.empty()) request.setAside = options.setAside;
   const auto counts = load(*engine, request, listener);

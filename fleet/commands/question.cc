@@ -47,7 +47,7 @@ Option addFormOptions(Command command, FleetContext& context, QuestionOptions& o
 }
 
 Question::Question(FleetContext& context, const QuestionOptions& options)
-    : engine_(context.openDatabase(OpenMode::kRead)),
+    : engine_(context.openDatabase(OpenMode::Read)),
       table_(*engine_),
       ledger_(table_, devicesAtLeastOf(options)),
       versions_(shownVersions(ledger_, {})) {
@@ -104,7 +104,7 @@ std::string Question::readVersion(std::string_view text) const {
     }
     found = &version;
   }
-  if (found == nullptr && std::ranges::all_of(table_.texts(Attribute::kOs), &std::string::empty)) {
+  if (found == nullptr && std::ranges::all_of(table_.texts(Attribute::Os), &std::string::empty)) {
     throw std::runtime_error(
         "no log says its OS version: load the logs with their metadata, see docs/fleet-loading.md");
   }
@@ -138,7 +138,7 @@ std::string joinedText(std::size_t joined, bool hasGroups, std::size_t devicesAt
   if (joined == 0) return "";
   const std::string why = "groups of fewer than " + std::to_string(devicesAtLeast) + " devices";
   if (!hasGroups) return "Not divided: the parts would reveal " + why + ".";
-  return PartName{PartKind::kOther}.text() + " joins " + counted(joined, "group") +
+  return PartName{PartKind::Other}.text() + " joins " + counted(joined, "group") +
          ", so that nothing reveals " + why + ".";
 }
 
@@ -149,11 +149,11 @@ std::string noMeanText() {
 
 const char* kindText(KeyKind kind) {
   switch (kind) {
-    case KeyKind::kScalar:
+    case KeyKind::Scalar:
       return "scalar";
-    case KeyKind::kDistribution:
+    case KeyKind::Distribution:
       return "distribution";
-    case KeyKind::kHistogram:
+    case KeyKind::Histogram:
       break;
   }
   return "histogram";
@@ -161,13 +161,13 @@ const char* kindText(KeyKind kind) {
 
 const char* kindText(const PartName& name) {
   switch (name.kind) {
-    case PartKind::kWhole:
+    case PartKind::Whole:
       return "all";
-    case PartKind::kNotReported:
+    case PartKind::NotReported:
       return "not_reported";
-    case PartKind::kOther:
+    case PartKind::Other:
       return "other";
-    case PartKind::kValue:
+    case PartKind::Value:
       break;
   }
   return "value";

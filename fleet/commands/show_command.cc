@@ -19,11 +19,11 @@ struct ShowOptions : QuestionOptions {
 };
 
 GroupBy groupBy(const std::string& name) {
-  return name == "os"       ? GroupBy::kOs
-         : name == "region" ? GroupBy::kRegion
-         : name == "day"    ? GroupBy::kDay
-         : name == "digest" ? GroupBy::kDigest
-                            : GroupBy::kNone;
+  return name == "os"       ? GroupBy::Os
+         : name == "region" ? GroupBy::Region
+         : name == "day"    ? GroupBy::Day
+         : name == "digest" ? GroupBy::Digest
+                            : GroupBy::None;
 }
 
 /// Tries a whole version first, then a range of days, then a part of a version.
@@ -55,7 +55,7 @@ std::vector<ShowAnswer> answers(Question& question, const ShowOptions& options) 
   if (!options.against.empty()) readAgainst(question, options.against, request);
   std::vector<ShowAnswer> result;
   for (const Key& key : question.engine().keys()) {
-    if (key.name != options.key || key.kind == KeyKind::kHistogram) continue;
+    if (key.name != options.key || key.kind == KeyKind::Histogram) continue;
     request.kind = key.kind;
     ShowAnswer answer = show(question.engine(), question.ledger(), request);
     // Not even whether a few devices have the statistic.

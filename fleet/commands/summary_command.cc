@@ -22,10 +22,10 @@ struct PartName {
   const char* name;   // in JSON and CSV
   const char* title;  // of the column
 };
-constexpr PartName kParts[] = {{GroupBy::kOs, "os", "OS VERSION"},
-                               {GroupBy::kRegion, "region", "REGION"},
-                               {GroupBy::kDigest, "digest", "WHITELIST"},
-                               {GroupBy::kDay, "day", "DAY"}};
+constexpr PartName kParts[] = {{GroupBy::Os, "os", "OS VERSION"},
+                               {GroupBy::Region, "region", "REGION"},
+                               {GroupBy::Digest, "digest", "WHITELIST"},
+                               {GroupBy::Day, "day", "DAY"}};
 
 const PartName& nameOf(GroupBy by) {
   for (const PartName& part : kParts) {

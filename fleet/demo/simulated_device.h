@@ -17,7 +17,7 @@ inline constexpr const char* kNewVersion = "Pellio 4.2 (16R349)";
 struct SimulatedLog {
   std::string log;
   std::string metadata;
-  std::int64_t filed = 0;  ///< seconds since 1970 UTC
+  std::int64_t filed = 0;  // seconds since 1970 UTC
 };
 
 class SimulatedDevice {

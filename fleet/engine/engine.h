@@ -60,11 +60,11 @@ struct CellValue {
   std::uint64_t count = 0;
 };
 
-enum class KeyKind : std::uint8_t { kScalar, kDistribution, kHistogram };
+enum class KeyKind : std::uint8_t { Scalar, Distribution, Histogram };
 
 struct Key {
   std::string name;
-  KeyKind kind = KeyKind::kScalar;
+  KeyKind kind = KeyKind::Scalar;
 };
 
 /// Rows come in blocks, in no particular order, each once. A visitor's exceptions reach the caller.
@@ -77,7 +77,7 @@ class Engine {
 
   struct Appended {
     std::size_t added = 0;
-    std::size_t known = 0;  ///< logs that were there before, or twice among the records
+    std::size_t known = 0;  // logs that were there before, or twice among the records
   };
 
   /// Files each record whole or not at all, even when the process is killed. Several loaders may

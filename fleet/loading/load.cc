@@ -43,15 +43,15 @@ class Loading {
       }
       return Done{};
     }
-    if (item.source.kind == SourceItem::Kind::kOther) {
+    if (item.source.kind == SourceItem::Kind::Other) {
       ++counts_.others;
       return Done{};
     }
-    if (item.source.kind == SourceItem::Kind::kTooNew) {
+    if (item.source.kind == SourceItem::Kind::TooNew) {
       ++counts_.tooNew;
       return Done{};
     }
-    const bool isRefused = item.source.kind == SourceItem::Kind::kRefused;
+    const bool isRefused = item.source.kind == SourceItem::Kind::Refused;
     listener_.note(format("%s: %s: %s", isRefused ? "refused" : "skipped", item.source.name,
                           item.source.reason));
     if (!isRefused) return Done{};

@@ -13,7 +13,7 @@ namespace {
 using Kind = SourceItem::Kind;
 
 void refuse(ReadItem& item, std::string reason) {
-  item.source.kind = Kind::kRefused;
+  item.source.kind = Kind::Refused;
   item.source.reason = std::move(reason);
 }
 
@@ -30,7 +30,7 @@ bool takeSidecar(ReadItem& item) {
   }
   source.metadata = *metadata;
   if (!isOtherLog(withoutGzip(fileNameOf(source.path)), &*metadata)) return true;
-  source.kind = Kind::kOther;
+  source.kind = Kind::Other;
   return false;
 }
 
@@ -39,7 +39,7 @@ bool takeSidecar(ReadItem& item) {
 ReadItem readItem(SourceItem source, LogReader& reader, const PermittedKeys& permitted) {
   ReadItem item;
   item.source = std::move(source);
-  if (item.source.kind == Kind::kFile) {
+  if (item.source.kind == Kind::File) {
     if (!takeSidecar(item)) return item;
     auto bytes = readSourceFile(item.source.path, limits::kLogBytes, item.source.mayBeLink);
     if (!bytes) {
@@ -47,7 +47,7 @@ ReadItem readItem(SourceItem source, LogReader& reader, const PermittedKeys& per
       return item;
     }
     item.source.content = *std::move(bytes);
-  } else if (item.source.kind != Kind::kContent) {
+  } else if (item.source.kind != Kind::Content) {
     return item;
   }
   auto record = reader.read(asBytes(item.source.content),

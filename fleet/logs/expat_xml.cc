@@ -14,12 +14,12 @@ namespace tavrel::fleet {
 namespace {
 
 constexpr std::array<std::pair<std::string_view, XmlValue>, 6> kValues = {{
-    {"key", XmlValue::kKey},
-    {"string", XmlValue::kString},
-    {"integer", XmlValue::kInteger},
-    {"real", XmlValue::kReal},
-    {"date", XmlValue::kDate},
-    {"data", XmlValue::kData},
+    {"key", XmlValue::Key},
+    {"string", XmlValue::String},
+    {"integer", XmlValue::Integer},
+    {"real", XmlValue::Real},
+    {"date", XmlValue::Date},
+    {"data", XmlValue::Data},
 }};
 
 bool isSpace(std::string_view text) {

@@ -12,19 +12,19 @@
 
 namespace tavrel::fleet {
 
-// Members up to `kHistograms` are mandatory.
+// Members up to `Histograms` are mandatory.
 enum class LogBuilder::Member : std::uint8_t {
-  kVersion,
-  kStartDate,
-  kCreationDate,
-  kScalars,
-  kDistributions,
-  kHistograms,
-  kMetadata,
-  kTaskID,
-  kWhitelistDigest,
-  kApplications,
-  kUnknown
+  Version,
+  StartDate,
+  CreationDate,
+  Scalars,
+  Distributions,
+  Histograms,
+  Metadata,
+  TaskID,
+  WhitelistDigest,
+  Applications,
+  Unknown
 };
 
 namespace {
@@ -62,7 +62,7 @@ std::string LogBuilder::path() const {
   if (levels_.empty()) return {};
   std::string path(shown(memberName_));
   const Place place = levels_.back().place;
-  if (place == Place::kRoot || place == Place::kSkipped) return path;
+  if (place == Place::Root || place == Place::Skipped) return path;
   if (!entry_.empty()) path.append("/").append(shown(entry_));
   if (!inner_.empty()) path.append("/").append(shown(inner_));
   return path;
@@ -78,29 +78,29 @@ bool LogBuilder::fail(std::string_view reason) {
 bool LogBuilder::wrongType() {
   const auto wanted = [&] {
     switch (levels_.back().place) {
-      case Place::kScalars:
+      case Place::Scalars:
         return "an integer";
-      case Place::kDistributions:
+      case Place::Distributions:
         return "an array of five numbers";
-      case Place::kNumbers:
+      case Place::Numbers:
         return numberCount_ == 4 ? "a summary whose count is an integer"
                                  : "an array of five numbers";
-      case Place::kCells:
+      case Place::Cells:
         return "an integer";
-      case Place::kRoot:
+      case Place::Root:
         break;
       default:
         return "a dictionary";
     }
     switch (member_) {
-      case Member::kVersion:
+      case Member::Version:
         return "an integer";
-      case Member::kStartDate:
-      case Member::kCreationDate:
+      case Member::StartDate:
+      case Member::CreationDate:
         return "a date";
-      case Member::kWhitelistDigest:
+      case Member::WhitelistDigest:
         return "a text";
-      case Member::kApplications:
+      case Member::Applications:
         return "an array";
       default:
         return "a dictionary";
@@ -125,8 +125,8 @@ bool LogBuilder::addRow() {
 // Whether the next value may be anything. Only a text is read as BHTaskID.
 bool LogBuilder::isIgnored() const {
   const Place place = levels_.back().place;
-  return place == Place::kSkipped ||
-         (place == Place::kRoot && (member_ == Member::kTaskID || member_ == Member::kUnknown));
+  return place == Place::Skipped ||
+         (place == Place::Root && (member_ == Member::TaskID || member_ == Member::Unknown));
 }
 
 // Checks that property lists allow a value here.
@@ -160,25 +160,25 @@ bool LogBuilder::key(std::string_view text) {
   Level& level = levels_.back();
   if (level.hasKey) return fail("a key has no value");
   level.hasKey = true;
-  if (level.place == Place::kSkipped) return true;
+  if (level.place == Place::Skipped) return true;
   if (text.size() > limits::kTextBytes) {
     return fail(format("a key has more than %zu bytes", limits::kTextBytes));
   }
   switch (level.place) {
-    case Place::kRoot: {
+    case Place::Root: {
       memberName_ = record_.texts.keep(text);
       std::uint8_t number = 0;
       while (number < kMembers.size() && kMembers[number] != text)
         ++number;
       member_ = static_cast<Member>(number);
-      if (member_ == Member::kUnknown) return true;
+      if (member_ == Member::Unknown) return true;
       if ((seen_ >> number & 1U) != 0) return fail("occurs twice");
       seen_ |= 1U << number;
       return true;
     }
-    case Place::kScalars:
-    case Place::kDistributions:
-    case Place::kHistograms:
+    case Place::Scalars:
+    case Place::Distributions:
+    case Place::Histograms:
       entry_ = record_.texts.keep(text);
       return true;
     default:
@@ -192,7 +192,7 @@ bool LogBuilder::begin(bool isDictionary) {
   if (levels_.size() == limits::kDepth) {
     return fail(format("containers nest deeper than %zu", limits::kDepth));
   }
-  Place inner = Place::kSkipped;
+  Place inner = Place::Skipped;
   if (!beginIn(isDictionary, inner)) return false;
   levels_.push_back({inner, isDictionary});
   return true;
@@ -200,30 +200,30 @@ bool LogBuilder::begin(bool isDictionary) {
 
 bool LogBuilder::beginIn(bool isDictionary, Place& inner) {
   if (levels_.empty()) {
-    inner = Place::kRoot;
+    inner = Place::Root;
     return isDictionary || fail("is not a tallied log: it is an array");
   }
   if (isIgnored()) return true;
-  return levels_.back().place == Place::kRoot ? beginRootMember(isDictionary, inner)
-                                              : beginEntry(isDictionary, inner);
+  return levels_.back().place == Place::Root ? beginRootMember(isDictionary, inner)
+                                             : beginEntry(isDictionary, inner);
 }
 
 bool LogBuilder::beginRootMember(bool isDictionary, Place& inner) {
   switch (member_) {
-    case Member::kMetadata:
-      inner = Place::kMetadata;
+    case Member::Metadata:
+      inner = Place::Metadata;
       break;
-    case Member::kScalars:
-      inner = Place::kScalars;
+    case Member::Scalars:
+      inner = Place::Scalars;
       break;
-    case Member::kDistributions:
-      inner = Place::kDistributions;
+    case Member::Distributions:
+      inner = Place::Distributions;
       break;
-    case Member::kHistograms:
-      inner = Place::kHistograms;
+    case Member::Histograms:
+      inner = Place::Histograms;
       break;
-    case Member::kApplications:
-      inner = Place::kApplications;
+    case Member::Applications:
+      inner = Place::Applications;
       return !isDictionary || wrongType();
     default:
       return wrongType();
@@ -233,21 +233,21 @@ bool LogBuilder::beginRootMember(bool isDictionary, Place& inner) {
 
 bool LogBuilder::beginEntry(bool isDictionary, Place& inner) {
   switch (levels_.back().place) {
-    case Place::kDistributions:
-      inner = Place::kNumbers;
+    case Place::Distributions:
+      inner = Place::Numbers;
       numberCount_ = 0;
       return !isDictionary || wrongType();
-    case Place::kHistograms:
-      inner = Place::kCells;
+    case Place::Histograms:
+      inner = Place::Cells;
       return isDictionary || wrongType();
-    case Place::kApplications:
+    case Place::Applications:
       if (!addRow()) return false;
       record_.applications.emplace_back();
-      inner = Place::kApplication;
+      inner = Place::Application;
       return isDictionary || wrongType();
-    case Place::kScalars:
-    case Place::kNumbers:
-    case Place::kCells:
+    case Place::Scalars:
+    case Place::Numbers:
+    case Place::Cells:
       return wrongType();
     default:
       return true;
@@ -257,10 +257,10 @@ bool LogBuilder::beginEntry(bool isDictionary, Place& inner) {
 bool LogBuilder::end() {
   const Level level = levels_.back();
   if (level.hasKey) return fail("the last key of a dictionary has no value");
-  if (level.place == Place::kNumbers && !endNumbers()) return false;
+  if (level.place == Place::Numbers && !endNumbers()) return false;
   levels_.pop_back();
   inner_ = {};
-  if (level.place != Place::kNumbers && level.place != Place::kCells) entry_ = {};
+  if (level.place != Place::Numbers && level.place != Place::Cells) entry_ = {};
   return true;
 }
 
@@ -299,30 +299,30 @@ bool LogBuilder::integer(const plist::Number& number) {
   if (isIgnored()) return true;
   const bool isLarge = number.kind() == plist::NumberKind::UInt64;
   switch (levels_.back().place) {
-    case Place::kRoot:
-      if (member_ != Member::kVersion) return wrongType();
+    case Place::Root:
+      if (member_ != Member::Version) return wrongType();
       return (!isLarge && number.int64() == 1) ||
              fail("is a version that this program does not know");
-    case Place::kScalars:
+    case Place::Scalars:
       if (isLarge) return fail("exceeds 64 bits with a sign");
       if (!addRow()) return false;
       record_.scalars.push_back({entry_, number.int64()});
       return true;
-    case Place::kNumbers:
+    case Place::Numbers:
       if (numberCount_ != 4) return addNumber(number.real());
       if (isLarge || number.int64() < 0) return fail("its count is negative");
       count_ = static_cast<std::uint64_t>(number.int64());
       ++numberCount_;
       return true;
-    case Place::kCells:
+    case Place::Cells:
       return addCell(number);
-    case Place::kApplication:
+    case Place::Application:
       if (inner_ == "orboID") record_.applications.back().orboID = number.int64();
       if (inner_ == "arch") record_.applications.back().arch = number.int64();
       return true;
-    case Place::kDistributions:
-    case Place::kHistograms:
-    case Place::kApplications:
+    case Place::Distributions:
+    case Place::Histograms:
+    case Place::Applications:
       return wrongType();
     default:
       return true;
@@ -332,23 +332,23 @@ bool LogBuilder::integer(const plist::Number& number) {
 bool LogBuilder::real(double number) {
   if (!takeSingleValue("a number")) return false;
   if (isIgnored()) return true;
-  return levels_.back().place == Place::kNumbers ? addNumber(number) : wrongType();
+  return levels_.back().place == Place::Numbers ? addNumber(number) : wrongType();
 }
 
 bool LogBuilder::string(std::string_view text) {
   if (!takeSingleValue("a text")) return false;
   switch (levels_.back().place) {
-    case Place::kRoot:
-      if (member_ == Member::kTaskID) return keepText(text, record_.taskID);
-      if (member_ == Member::kWhitelistDigest) return keepText(text, record_.whitelistDigest);
+    case Place::Root:
+      if (member_ == Member::TaskID) return keepText(text, record_.taskID);
+      if (member_ == Member::WhitelistDigest) return keepText(text, record_.whitelistDigest);
       return isIgnored() || wrongType();
-    case Place::kMetadata:
+    case Place::Metadata:
       if (inner_ == "BHUserInterfaceLanguage") return keepText(text, record_.language);
       if (inner_ == "BHPreferredUserInterfaceLanguage") {
         return keepText(text, record_.preferredLanguage);
       }
       return inner_ != "BHUserSetRegionFormat" || keepText(text, record_.region);
-    case Place::kApplication: {
+    case Place::Application: {
       ApplicationRow& application = record_.applications.back();
       if (inner_ == "bundle") return keepText(text, application.bundle);
       if (inner_ == "version") return keepText(text, application.version);
@@ -362,13 +362,13 @@ bool LogBuilder::string(std::string_view text) {
 bool LogBuilder::date(plist::Date date) {
   if (!takeSingleValue("a date")) return false;
   if (isIgnored()) return true;
-  if (levels_.back().place != Place::kRoot ||
-      (member_ != Member::kStartDate && member_ != Member::kCreationDate)) {
+  if (levels_.back().place != Place::Root ||
+      (member_ != Member::StartDate && member_ != Member::CreationDate)) {
     return wrongType();
   }
   if (!isInCalendar(date)) return fail("is not within the years 2000 to 2099");
   const std::int64_t seconds = wholeSeconds(date);
-  if (member_ == Member::kCreationDate) {
+  if (member_ == Member::CreationDate) {
     record_.created = seconds;
     return true;
   }

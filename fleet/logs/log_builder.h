@@ -43,16 +43,16 @@ class LogBuilder {
 
  private:
   enum class Place : std::uint8_t {
-    kRoot,
-    kMetadata,
-    kScalars,
-    kDistributions,
-    kNumbers,
-    kHistograms,
-    kCells,
-    kApplications,
-    kApplication,
-    kSkipped
+    Root,
+    Metadata,
+    Scalars,
+    Distributions,
+    Numbers,
+    Histograms,
+    Cells,
+    Applications,
+    Application,
+    Skipped
   };
   struct Level {
     Place place;

@@ -37,11 +37,11 @@ std::string LogReader::readDocument(ByteSpan document, LogRecord& record) {
   }
   if (!looksLikeXml(text)) return "is not a property list";
   switch (readPlainXml(text, builder)) {
-    case PlainXml::kRead:
+    case PlainXml::Read:
       return builder.finish() ? std::string() : builder.fault();
-    case PlainXml::kRefused:
+    case PlainXml::Refused:
       return builder.fault();
-    case PlainXml::kNotPlain:
+    case PlainXml::NotPlain:
       break;
   }
   record = {};

@@ -48,15 +48,15 @@ class Reader {
   PlainXml read() {
     take("<?xml version=\"1.0\" encoding=\"UTF-8\"?>");
     skipSpace();
-    if (!take("<plist version=\"1.0\">")) return PlainXml::kNotPlain;
+    if (!take("<plist version=\"1.0\">")) return PlainXml::NotPlain;
     do {
       skipSpace();
       if (!readElement()) return outcome_;
     } while (!containers_.empty());
     skipSpace();
-    if (!take("</plist>")) return PlainXml::kNotPlain;
+    if (!take("</plist>")) return PlainXml::NotPlain;
     skipSpace();
-    return rest_.empty() ? PlainXml::kRead : PlainXml::kNotPlain;
+    return rest_.empty() ? PlainXml::Read : PlainXml::NotPlain;
   }
 
  private:
@@ -78,7 +78,7 @@ class Reader {
   }
 
   bool built(bool taken) {
-    if (!taken) outcome_ = PlainXml::kRefused;
+    if (!taken) outcome_ = PlainXml::Refused;
     return taken;
   }
 
@@ -89,18 +89,18 @@ class Reader {
       case '/':
         return readEnd();
       case 'k':
-        return take("<key>") && readValue(XmlValue::kKey, "</key>");
+        return take("<key>") && readValue(XmlValue::Key, "</key>");
       case 'i':
-        return take("<integer>") && readValue(XmlValue::kInteger, "</integer>");
+        return take("<integer>") && readValue(XmlValue::Integer, "</integer>");
       case 'r':
-        return take("<real>") && readValue(XmlValue::kReal, "</real>");
+        return take("<real>") && readValue(XmlValue::Real, "</real>");
       case 's':
-        return take("<string>") && readValue(XmlValue::kString, "</string>");
+        return take("<string>") && readValue(XmlValue::String, "</string>");
       case 'd':
         if (take("<dict>")) return begin(true);
         if (take("<dict/>")) return begin(true) && end();
-        if (take("<date>")) return readValue(XmlValue::kDate, "</date>");
-        return take("<data>") && readValue(XmlValue::kData, "</data>");
+        if (take("<date>")) return readValue(XmlValue::Date, "</date>");
+        return take("<data>") && readValue(XmlValue::Data, "</data>");
       case 'a':
         if (take("<array>")) return begin(false);
         return take("<array/>") && begin(false) && end();
@@ -174,7 +174,7 @@ class Reader {
   LogBuilder& builder_;
   std::vector<bool> containers_;  // whether each is a dictionary
   std::string unescaped_;
-  PlainXml outcome_ = PlainXml::kNotPlain;
+  PlainXml outcome_ = PlainXml::NotPlain;
 };
 
 }  // namespace

@@ -11,9 +11,9 @@
 namespace tavrel::fleet {
 
 enum class PlainXml : std::uint8_t {
-  kRead,      ///< to its end, where the property list ends as well
-  kRefused,   ///< by the builder
-  kNotPlain,  ///< the document has another form, or is not a property list
+  Read,      // to its end, where the property list ends as well
+  Refused,   // by the builder
+  NotPlain,  // the document has another form, or is not a property list
 };
 
 PlainXml readPlainXml(std::string_view document, LogBuilder& builder);

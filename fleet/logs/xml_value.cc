@@ -28,17 +28,17 @@ bool refuse(LogBuilder& builder, std::string_view text, std::string_view wanted)
 
 bool buildValue(LogBuilder& builder, XmlValue element, std::string_view text) {
   switch (element) {
-    case XmlValue::kKey:
+    case XmlValue::Key:
       return builder.key(text);
-    case XmlValue::kString:
+    case XmlValue::String:
       return builder.string(text);
-    case XmlValue::kInteger:
+    case XmlValue::Integer:
       if (const auto number = plist::parseInteger(trimmed(text))) return builder.integer(*number);
       return refuse(builder, text, "a 64-bit integer");
-    case XmlValue::kReal:
+    case XmlValue::Real:
       if (const auto number = plist::parseReal(trimmed(text))) return builder.real(*number);
       return refuse(builder, text, "a number in the range of a double");
-    case XmlValue::kDate:
+    case XmlValue::Date:
       if (const auto date = parseIsoInstant(trimmed(text))) return builder.date(*date);
       return refuse(builder, text, "a date of the form YYYY-MM-DDTHH:MM:SSZ");
     default:

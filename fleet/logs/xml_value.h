@@ -8,7 +8,7 @@
 
 namespace tavrel::fleet {
 
-enum class XmlValue : std::uint8_t { kKey, kString, kInteger, kReal, kDate, kData };
+enum class XmlValue : std::uint8_t { Key, String, Integer, Real, Date, Data };
 
 /// Passes the text of an element to the builder; false when the log is refused.
 bool buildValue(LogBuilder& builder, XmlValue element, std::string_view text);

@@ -34,8 +34,8 @@ struct DistributionRow {
 /// One bucket of a histogram: the values above `lower`, up to and including `upper`.
 struct CellRow {
   std::string_view key;
-  double lower = 0;  ///< -inf for the first bucket
-  double upper = 0;  ///< inf for the last one, which also counts not-a-number
+  double lower = 0;  // -inf for the first bucket
+  double upper = 0;  // inf for the last one, which also counts not-a-number
   std::string_view label;
   std::uint64_t count = 0;
 };
@@ -51,13 +51,12 @@ struct ApplicationRow {
 struct LogRecord {
   /// SHA-256 of the content, the same in every encoding; identifies a log that comes twice
   std::array<std::byte, 32> digest{};
-  std::int32_t day = 0;      ///< the reported day, in days since 1970 UTC
-  std::int64_t created = 0;  ///< seconds since 1970 UTC
+  std::int32_t day = 0;      // the reported day, in days since 1970 UTC
+  std::int64_t created = 0;  // seconds since 1970 UTC
 
   // Texts live in the arena. Whatever a log or its metadata does not say is empty.
   std::string_view osVersion;
-  std::string_view
-      previousOsVersion;  ///< differs from `osVersion` in the first log after an update
+  std::string_view previousOsVersion;  // differs from `osVersion` in the first log after an update
   std::string_view configNumber;
   std::string_view whitelistDigest;
   std::string_view taskID;

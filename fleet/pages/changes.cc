@@ -47,7 +47,7 @@ std::string chanceText(double probability) {
 }
 
 const char* kindText(KeyKind kind) {
-  return kind == KeyKind::kScalar ? "daily value" : "daily mean";
+  return kind == KeyKind::Scalar ? "daily value" : "daily mean";
 }
 
 /// Adds the kind when both kinds of the key are compared.

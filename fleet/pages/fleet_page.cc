@@ -15,7 +15,7 @@ constexpr std::size_t kMostStatistics = 40;
 
 /// Whether a scalar shows the wear of a drive: see docs/catalogue/channels.md and nand.md.
 bool tellsOfWear(const Key& key) {
-  if (key.kind != KeyKind::kScalar) return false;
+  if (key.kind != KeyKind::Scalar) return false;
   for (const std::string_view end :
        {".used_pct", ".life_a_pct", ".life_b_pct", ".erases_max", ".waf_milli", ".spare_pct",
         ".AverageCycle", ".HottestCycle"}) {
@@ -28,7 +28,7 @@ ShowAnswer askAbout(Engine& engine, Ledger& ledger, const Key& key, const DayRan
   ShowRequest request;
   request.key = key.name;
   request.kind = key.kind;
-  request.by = GroupBy::kOs;
+  request.by = GroupBy::Os;
   request.days = days;
   request.leavesSmallOut = true;
   return show(engine, ledger, request);
@@ -39,7 +39,7 @@ ShowAnswer askAbout(Engine& engine, Ledger& ledger, const Key& key, const DayRan
 FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
   FleetPage page;
   // The same logs as in the statistics: otherwise subtracting these would reveal small versions.
-  page.summary = summarise(engine, ledger, days, SmallVersions::kLeftOut);
+  page.summary = summarise(engine, ledger, days, SmallVersions::LeftOut);
   if (!page.summary.isShown) return page;
   if (const auto versions = newestVersions(ledger, days)) {
     page.comparison = compare(engine, ledger, {versions->first, versions->second, days});
@@ -62,7 +62,7 @@ FleetPage askForPage(Engine& engine, Ledger& ledger, const DayRange& days) {
       add(one.key);
     }
   }
-  for (const KeyKind kind : {KeyKind::kDistribution, KeyKind::kScalar}) {
+  for (const KeyKind kind : {KeyKind::Distribution, KeyKind::Scalar}) {
     for (const Key& key : page.summary.keys) {
       if (key.kind == kind && !known.contains({key.kind, key.name})) add(key);
     }
@@ -111,7 +111,7 @@ std::string textOf(const FleetPage& page) {
   html.element("p", "Groups of fewer than " + countText(summary.devicesAtLeast) +
                         " devices are not shown by themselves. The page leaves out all logs of "
                         "such versions; other groups are joined as \"" +
-                        PartName{PartKind::kOther}.text() +
+                        PartName{PartKind::Other}.text() +
                         "\", and where a subtraction could reveal them, so is the next larger "
                         "group. Buckets of histograms are joined in the same way.");
   html.element("p",

@@ -13,10 +13,10 @@ namespace tavrel::fleet {
 
 struct FleetPage {
   SummaryAnswer summary;
-  std::optional<CompareAnswer> comparison;  ///< of the two newest versions
-  std::vector<ShowAnswer> wear;             ///< of the flash, by version
-  std::vector<ShowAnswer> statistics;       ///< others, by version
-  std::size_t furtherStatistics = 0;        ///< statistics that the page has no room for
+  std::optional<CompareAnswer> comparison;  // of the two newest versions
+  std::vector<ShowAnswer> wear;             // of the flash, by version
+  std::vector<ShowAnswer> statistics;       // others, by version
+  std::size_t furtherStatistics = 0;        // statistics that the page has no room for
 };
 
 /// Asks all questions of the page in one run. Throws EngineError.

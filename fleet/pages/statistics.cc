@@ -148,7 +148,7 @@ void writeStatistic(page::HtmlWriter& html, const ShowAnswer& answer) {
     html.name(answer.request.key);
     html.text(", ");
   }
-  const bool isScalar = answer.request.kind == KeyKind::kScalar;
+  const bool isScalar = answer.request.kind == KeyKind::Scalar;
   html.text(isScalar ? "one value per log" : "many values per log");
   if (!unit.empty()) html.text(" (" + std::string(unit) + ")");
   html.end();
@@ -177,9 +177,9 @@ std::string counted(std::size_t count, const std::string& what) {
 
 void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
   for (const SummaryPart& part : summary.parts) {
-    if (part.by == GroupBy::kOs) writeGroups(html, "OS versions", part, summary.devicesAtLeast);
-    if (part.by == GroupBy::kRegion) writeGroups(html, "Regions", part, summary.devicesAtLeast);
-    if (part.by != GroupBy::kDay) continue;
+    if (part.by == GroupBy::Os) writeGroups(html, "OS versions", part, summary.devicesAtLeast);
+    if (part.by == GroupBy::Region) writeGroups(html, "Regions", part, summary.devicesAtLeast);
+    if (part.by != GroupBy::Day) continue;
     page::LineChart chart;
     chart.name = "Devices by day";
     chart.text = [](double value) { return page::shortNumber(value); };

@@ -28,8 +28,8 @@ class CellClasses {
   void add(LogIndex log, const Cell& cell);
 
   struct Coarsened {
-    std::vector<Cell> cells;  ///< none when all of them together have too few devices
-    bool isJoined = false;    ///< whether some were joined
+    std::vector<Cell> cells;  // none when all of them together have too few devices
+    bool isJoined = false;    // whether some were joined
   };
   Coarsened coarsened(std::size_t devicesAtLeast) const;
 

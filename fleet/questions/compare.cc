@@ -20,17 +20,17 @@ namespace {
 
 constexpr std::size_t kThreads = 2;
 
-enum class Side : std::uint8_t { kBefore, kAfter, kNeither };
+enum class Side : std::uint8_t { Before, After, Neither };
 
 std::vector<Side> sidesOf(const LogTable& table, const CompareRequest& request) {
-  const auto before = table.number(Attribute::kOs, request.oldVersion);
-  const auto after = table.number(Attribute::kOs, request.newVersion);
-  std::vector<Side> sides(table.size(), Side::kNeither);
+  const auto before = table.number(Attribute::Os, request.oldVersion);
+  const auto after = table.number(Attribute::Os, request.newVersion);
+  std::vector<Side> sides(table.size(), Side::Neither);
   for (LogIndex log = 0; log < table.size(); ++log) {
     if (!request.days.contains(table.day(log))) continue;
-    const std::uint32_t version = table.attribute(Attribute::kOs, log);
-    if (version == before) sides[log] = Side::kBefore;
-    if (version == after) sides[log] = Side::kAfter;
+    const std::uint32_t version = table.attribute(Attribute::Os, log);
+    if (version == before) sides[log] = Side::Before;
+    if (version == after) sides[log] = Side::After;
   }
   return sides;
 }
@@ -228,10 +228,10 @@ class Comparer {
     std::array<Sample, 2> samples = {Sample(table), Sample(table)};
     const auto add = [&](LogId id, const auto& value) {
       const LogIndex log = table.find(id);
-      if (log == kNoLog || sides_[log] == Side::kNeither) return;
+      if (log == kNoLog || sides_[log] == Side::Neither) return;
       samples[static_cast<std::size_t>(sides_[log])].add(log, value);
     };
-    if (key.kind == KeyKind::kScalar) {
+    if (key.kind == KeyKind::Scalar) {
       engine.scalars(key.name, [&](std::span<const ScalarValue> rows) {
         for (const ScalarValue& row : rows)
           add(row.log, row.value);
@@ -279,7 +279,7 @@ void correctAndSort(std::vector<Comparison>& comparisons) {
 
 CompareAnswer compare(Engine& engine, Ledger& ledger, const CompareRequest& request) {
   std::vector<Key> keys = engine.keys();
-  std::erase_if(keys, [](const Key& key) { return key.kind == KeyKind::kHistogram; });
+  std::erase_if(keys, [](const Key& key) { return key.kind == KeyKind::Histogram; });
   Comparer comparer(ledger, request, std::move(keys));
   comparer.run(engine);
   CompareAnswer answer = comparer.answer(ledger, request);

@@ -27,26 +27,26 @@ struct CompareRequest {
 
 struct ComparedSide {
   std::size_t logs = 0;
-  std::size_t logsWithoutMean = 0;  ///< not among `logs`
-  std::size_t devices = 0;          ///< the largest number of logs on one day
+  std::size_t logsWithoutMean = 0;  // not among `logs`
+  std::size_t devices = 0;          // the largest number of logs on one day
   double mean = 0;
-  std::optional<double> deviation;  ///< standard deviation over logs
+  std::optional<double> deviation;  // standard deviation over logs
 };
 
 struct Comparison {
   Key key;
   ComparedSide before;
   ComparedSide after;
-  double difference = 0;           ///< of the means: after - before
-  std::optional<double> relative;  ///< to the magnitude of the mean before; nothing when that is 0
+  double difference = 0;           // of the means: after - before
+  std::optional<double> relative;  // to the magnitude of the mean before; nothing when that is 0
   /// In standard deviations (the root of the mean variance of both sides). Nothing when the means
   /// differ although neither side varies: no effect is stronger.
   std::optional<double> effect;
   /// Half the width of the interval around `difference` that covers the true one with probability
   /// `kConfidenceLevel`, for this key by itself.
   double margin = 0;
-  double pValue = 0;  ///< probability of such a difference by chance, for this key by itself
-  double adjustedPValue = 0;  ///< the same after Holm's correction for all keys of the answer
+  double pValue = 0;          // probability of such a difference by chance, for this key by itself
+  double adjustedPValue = 0;  // the same after Holm's correction for all keys of the answer
 
   bool isSignificant() const { return adjustedPValue < 1 - kConfidenceLevel; }
 };
@@ -56,9 +56,9 @@ struct CompareAnswer {
   std::size_t devicesAtLeast = 0;
   /// The keys that differ come first; within each part, the strongest come first.
   std::vector<Comparison> comparisons;
-  std::size_t missing = 0;  ///< keys that at most one version has
-  std::size_t tooFew = 0;   ///< keys for which one version has too few devices
-  std::size_t unfit = 0;    ///< keys for which one version has no log with a mean
+  std::size_t missing = 0;  // keys that at most one version has
+  std::size_t tooFew = 0;   // keys for which one version has too few devices
+  std::size_t unfit = 0;    // keys for which one version has no log with a mean
 };
 
 /// Reads the keys one by one, in two threads. Throws EngineError.

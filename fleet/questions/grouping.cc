@@ -49,13 +49,13 @@ bool versionLess(std::string_view a, std::string_view b) {
 
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast) {
-  if (by == GroupBy::kNone) return {{{PartKind::kWhole}, logs}};
+  if (by == GroupBy::None) return {{{PartKind::Whole}, logs}};
 
   // Reduces each attribute to an index into its values.
-  const Attribute of = by == GroupBy::kOs       ? Attribute::kOs
-                       : by == GroupBy::kRegion ? Attribute::kRegion
-                                                : Attribute::kDigest;
-  const bool byDay = by == GroupBy::kDay;
+  const Attribute of = by == GroupBy::Os       ? Attribute::Os
+                       : by == GroupBy::Region ? Attribute::Region
+                                               : Attribute::Digest;
+  const bool byDay = by == GroupBy::Day;
   const auto valueOf = [&](LogIndex log) {
     return byDay ? table.dayIndex(log) : table.attribute(of, log);
   };
@@ -88,32 +88,32 @@ std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy b
     groupOf[value] = groups.size();
     const std::string text =
         byDay ? dateText(civilFromDays(table.days()[value].day)) : texts[value];
-    groups.push_back({{text.empty() ? PartKind::kNotReported : PartKind::kValue, text}, LogSet()});
+    groups.push_back({{text.empty() ? PartKind::NotReported : PartKind::Value, text}, LogSet()});
   }
-  groups.push_back({{PartKind::kOther}, LogSet(), smallValues});
+  groups.push_back({{PartKind::Other}, LogSet(), smallValues});
   logs.forEach([&](LogIndex log) { groups[groupOf[valueOf(log)]].logs.insert(log); });
   return groups;
 }
 
 void leaveSmallOut(std::vector<Group>& groups, const Ledger& ledger) {
   std::erase_if(groups, [&](const Group& group) {
-    return group.name.kind == PartKind::kOther || !ledger.hasEnough(group.logs);
+    return group.name.kind == PartKind::Other || !ledger.hasEnough(group.logs);
   });
 }
 
 std::vector<std::string> shownVersions(const Ledger& ledger, const DayRange& days) {
   const LogTable& table = ledger.table();
-  const auto texts = table.texts(Attribute::kOs);
+  const auto texts = table.texts(Attribute::Os);
   std::vector<std::size_t> devices(texts.size());
   std::vector<std::size_t> ofDay(texts.size());
   for (const LogTable::Day& day : table.days()) {
     if (!days.contains(day.day)) continue;
     for (LogIndex log = day.begin; log < day.end; ++log) {
-      const std::uint32_t version = table.attribute(Attribute::kOs, log);
+      const std::uint32_t version = table.attribute(Attribute::Os, log);
       devices[version] = std::max(devices[version], ++ofDay[version]);
     }
     for (LogIndex log = day.begin; log < day.end; ++log)
-      ofDay[table.attribute(Attribute::kOs, log)] = 0;
+      ofDay[table.attribute(Attribute::Os, log)] = 0;
   }
   std::vector<std::string> versions;
   for (std::size_t version = 0; version < texts.size(); ++version) {

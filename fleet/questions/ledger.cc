@@ -21,8 +21,7 @@ JoinOrder joinOrder(const Ledger& ledger, const std::string& subject,
   JoinOrder order;
   std::vector<std::pair<bool, std::size_t>> ranks;
   for (const Group& group : groups) {
-    const bool isAllowed =
-        group.name.kind != PartKind::kOther && ledger.allows(subject, group.logs);
+    const bool isAllowed = group.name.kind != PartKind::Other && ledger.allows(subject, group.logs);
     if (!isAllowed) ++order.forbidden;
     order.positions.push_back(ranks.size());
     ranks.emplace_back(isAllowed, group.logs.devices(ledger.table()));
@@ -113,11 +112,11 @@ std::vector<Ledger::Sets> Ledger::divisionsOf(const std::string& subject,
 }
 
 std::string subjectOf(KeyKind kind, const std::string& key) {
-  return (kind == KeyKind::kScalar ? "scalar " : "distribution ") + key;
+  return (kind == KeyKind::Scalar ? "scalar " : "distribution ") + key;
 }
 
 std::string subjectOfMeans(KeyKind kind, const std::string& key) {
-  return kind == KeyKind::kScalar ? subjectOf(kind, key) : "mean of " + subjectOf(kind, key);
+  return kind == KeyKind::Scalar ? subjectOf(kind, key) : "mean of " + subjectOf(kind, key);
 }
 
 Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> groups) {
@@ -170,7 +169,7 @@ Division divide(Ledger& ledger, const std::string& subject, std::vector<Group> g
   for (std::size_t i = 0; i < groups.size(); ++i) {
     if (!isJoined[i]) division.groups.push_back(std::move(groups[i]));
   }
-  if (joined != 0) division.groups.push_back({{PartKind::kOther}, std::move(other)});
+  if (joined != 0) division.groups.push_back({{PartKind::Other}, std::move(other)});
   sets.clear();
   for (const Group& group : division.groups)
     sets.push_back(&group.logs);

@@ -75,13 +75,13 @@ std::string subjectOfMeans(KeyKind kind, const std::string& key);
 struct Group {
   PartName name;
   LogSet logs;
-  std::size_t values = 1;  ///< how many values of the attribute it stands for
+  std::size_t values = 1;  // how many values of the attribute it stands for
 };
 
 /// A set of logs and its parts.
 struct Division {
   LogSet whole;
-  bool isShown = false;  ///< when false, nothing of it may be shown
+  bool isShown = false;  // when false, nothing of it may be shown
   std::vector<Group> groups;
   /// How many values were joined into the last group, which is of the kind kOther.
   std::size_t joined = 0;

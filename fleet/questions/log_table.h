@@ -15,7 +15,7 @@
 
 namespace tavrel::fleet {
 
-enum class Attribute : std::uint8_t { kOs, kRegion, kDigest };
+enum class Attribute : std::uint8_t { Os, Region, Digest };
 inline constexpr std::size_t kAttributes = 3;
 
 /// The position of a log in a LogTable.

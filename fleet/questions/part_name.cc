@@ -4,13 +4,13 @@ namespace tavrel::fleet {
 
 std::string PartName::text() const {
   switch (kind) {
-    case PartKind::kWhole:
+    case PartKind::Whole:
       return "(all)";
-    case PartKind::kNotReported:
+    case PartKind::NotReported:
       return "(not reported)";
-    case PartKind::kOther:
+    case PartKind::Other:
       return "(other)";
-    case PartKind::kValue:
+    case PartKind::Value:
       break;
   }
   return value.starts_with('(') || value.starts_with('"') ? '"' + value + '"' : value;

@@ -7,17 +7,17 @@
 namespace tavrel::fleet {
 
 enum class PartKind : std::uint8_t {
-  kWhole,
-  kValue,        ///< the logs with one value of an attribute
-  kNotReported,  ///< the logs without the attribute
-  kOther,        ///< logs with several values, none of which may be shown by itself
+  Whole,
+  Value,        // the logs with one value of an attribute
+  NotReported,  // the logs without the attribute
+  Other,        // logs with several values, none of which may be shown by itself
 };
 
 struct PartName {
-  PartKind kind = PartKind::kWhole;
-  std::string value = {};  ///< empty unless the kind is kValue
+  PartKind kind = PartKind::Whole;
+  std::string value = {};  // empty unless the kind is kValue
 
-  bool isValue() const { return kind == PartKind::kValue; }
+  bool isValue() const { return kind == PartKind::Value; }
   /// For people: "(all)", "(not reported)", "(other)", or the value, in quotation marks when it
   /// begins with a parenthesis or a quotation mark.
   std::string text() const;

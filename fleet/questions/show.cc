@@ -27,7 +27,7 @@ struct Rows {
 
 Rows readRows(Engine& engine, const LogTable& table, const ShowRequest& request) {
   Rows rows;
-  if (request.kind == KeyKind::kScalar) {
+  if (request.kind == KeyKind::Scalar) {
     engine.scalars(request.key, [&](std::span<const ScalarValue> values) {
       for (const ScalarValue& row : values) {
         const LogIndex log = table.find(row.log);
@@ -70,7 +70,7 @@ class SideAnswer {
 
     // Without groups, the whole is the only part.
     std::vector<Group> parts = division.groups;
-    if (parts.empty()) parts.push_back({{PartKind::kWhole}, division.whole});
+    if (parts.empty()) parts.push_back({{PartKind::Whole}, division.whole});
     partOf_.assign(table_.size(), parts.size());
     for (std::size_t part = 0; part < parts.size(); ++part) {
       parts[part].logs.forEach([&](LogIndex log) { partOf_[log] = part; });
@@ -79,7 +79,7 @@ class SideAnswer {
     sets.reserve(parts.size());
     for (const Group& part : parts)
       sets.push_back(setOf(part.name, part.logs));
-    side.whole = setOf({PartKind::kWhole}, division.whole);
+    side.whole = setOf({PartKind::Whole}, division.whole);
 
     spread(sets, side.whole);
     merge(sets, side.whole);
@@ -235,11 +235,11 @@ ShowAnswer show(Engine& engine, Ledger& ledger, const ShowRequest& request) {
     std::vector<Group> groups = groupsOf(table, logs, request.by, ledger.devicesAtLeast());
     if (request.leavesSmallOut) leaveSmallOut(groups, ledger);
     Division division = divide(ledger, subject, std::move(groups));
-    if (request.by == GroupBy::kNone) division.groups.clear();
+    if (request.by == GroupBy::None) division.groups.clear();
     answer.sides.push_back(answers.answer(std::move(title), division));
   };
   const auto isOfVersion = [&](LogIndex log) {
-    return table.texts(Attribute::kOs)[table.attribute(Attribute::kOs, log)] ==
+    return table.texts(Attribute::Os)[table.attribute(Attribute::Os, log)] ==
            *request.againstVersion;
   };
   addSide(request.againstVersion ? "all other versions" : textOf(request.days), [&](LogIndex log) {

@@ -34,13 +34,13 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
     }
   };
   switch (key.kind) {
-    case KeyKind::kScalar:
+    case KeyKind::Scalar:
       engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
       break;
-    case KeyKind::kDistribution:
+    case KeyKind::Distribution:
       engine.distributions(key.name, [&](std::span<const DistributionValue> rows) { take(rows); });
       break;
-    case KeyKind::kHistogram:
+    case KeyKind::Histogram:
       engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
       break;
   }
@@ -59,14 +59,14 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days, Sm
   answer.devicesAtLeast = ledger.devicesAtLeast();
   answer.days = days;
   LogSet logs = logsOn(table, days);
-  if (small == SmallVersions::kLeftOut) {
-    std::vector<Group> versions = groupsOf(table, logs, GroupBy::kOs, ledger.devicesAtLeast());
+  if (small == SmallVersions::LeftOut) {
+    std::vector<Group> versions = groupsOf(table, logs, GroupBy::Os, ledger.devicesAtLeast());
     leaveSmallOut(versions, ledger);
     logs = LogSet();
     for (const Group& version : versions)
       logs.add(version.logs);
   }
-  for (const GroupBy by : {GroupBy::kOs, GroupBy::kRegion, GroupBy::kDigest, GroupBy::kDay}) {
+  for (const GroupBy by : {GroupBy::Os, GroupBy::Region, GroupBy::Digest, GroupBy::Day}) {
     const Division division =
         divide(ledger, "logs", groupsOf(table, logs, by, ledger.devicesAtLeast()));
     if (!division.isShown) return answer;
@@ -77,12 +77,12 @@ SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days, Sm
     answer.parts.push_back(std::move(part));
   }
   answer.isShown = true;
-  answer.whole = countedGroup(ledger, {PartKind::kWhole}, logs);
+  answer.whole = countedGroup(ledger, {PartKind::Whole}, logs);
   answer.keys = shownKeys(engine, ledger, logs);
   for (const Key& key : answer.keys) {
-    std::size_t& count = key.kind == KeyKind::kScalar         ? answer.scalarKeys
-                         : key.kind == KeyKind::kDistribution ? answer.distributionKeys
-                                                              : answer.histogramKeys;
+    std::size_t& count = key.kind == KeyKind::Scalar         ? answer.scalarKeys
+                         : key.kind == KeyKind::Distribution ? answer.distributionKeys
+                                                             : answer.histogramKeys;
     ++count;
   }
   return answer;

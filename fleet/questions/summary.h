@@ -14,24 +14,24 @@ namespace tavrel::fleet {
 struct CountedGroup {
   PartName name;
   std::size_t logs = 0;
-  std::size_t devices = 0;    ///< the largest number of its logs on one day
-  std::int32_t firstDay = 0;  ///< the first day with enough devices
+  std::size_t devices = 0;    // the largest number of its logs on one day
+  std::int32_t firstDay = 0;  // the first day with enough devices
   std::int32_t lastDay = 0;
 };
 
 struct SummaryPart {
-  GroupBy by = GroupBy::kNone;
-  std::vector<CountedGroup> groups;  ///< empty when the logs cannot be divided by this attribute
-  std::size_t joined = 0;            ///< groups that are shown as one
+  GroupBy by = GroupBy::None;
+  std::vector<CountedGroup> groups;  // empty when the logs cannot be divided by this attribute
+  std::size_t joined = 0;            // groups that are shown as one
 };
 
 struct SummaryAnswer {
   std::size_t devicesAtLeast = 0;
-  DayRange days;         ///< the days asked for
-  bool isShown = false;  ///< when false, there are too few devices, and the rest is empty
+  DayRange days;         // the days asked for
+  bool isShown = false;  // when false, there are too few devices, and the rest is empty
   CountedGroup whole;
-  std::vector<SummaryPart> parts;  ///< by version, region, whitelist and day
-  std::vector<Key> keys;           ///< the statistics that have enough devices
+  std::vector<SummaryPart> parts;  // by version, region, whitelist and day
+  std::vector<Key> keys;           // the statistics that have enough devices
   std::size_t scalarKeys = 0;
   std::size_t distributionKeys = 0;
   std::size_t histogramKeys = 0;
@@ -44,10 +44,10 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among);
 
 /// What happens to logs of versions that have too few devices.
-enum class SmallVersions : std::uint8_t { kJoined, kLeftOut };
+enum class SmallVersions : std::uint8_t { Joined, LeftOut };
 
 /// Throws EngineError.
 SummaryAnswer summarise(Engine& engine, Ledger& ledger, const DayRange& days,
-                        SmallVersions small = SmallVersions::kJoined);
+                        SmallVersions small = SmallVersions::Joined);
 
 }  // namespace tavrel::fleet

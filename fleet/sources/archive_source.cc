@@ -154,7 +154,7 @@ Expected<std::optional<LogMetadata>> metadataOf(const std::string& name, const S
 void visitArchive(const std::string& path, const UploadLines& lines, const SourceSink& sink) {
   const auto refuse = [&](const std::string& reason) {
     SourceItem item;
-    item.kind = Kind::kRefused;
+    item.kind = Kind::Refused;
     item.name = path;
     item.reason = reason;
     sink(std::move(item));
@@ -169,7 +169,7 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
     SourceItem item;
     item.name = format("%s: %s", path, name);
     if (!isFile(entry)) {
-      item.kind = Kind::kSkipped;
+      item.kind = Kind::Skipped;
       item.reason = "is not a regular file";
       sink(std::move(item));
       continue;
@@ -177,18 +177,18 @@ void visitArchive(const std::string& path, const UploadLines& lines, const Sourc
     const auto metadata = metadataOf(name, *sidecars, lines);
     if (metadata) item.metadata = *metadata;
     if (isOtherLog(withoutGzip(fileNameOf(name)), item.metadata ? &*item.metadata : nullptr)) {
-      item.kind = Kind::kOther;
+      item.kind = Kind::Other;
     } else if (archive.read(limits::kLogBytes, item.content)) {
-      item.kind = Kind::kRefused;
+      item.kind = Kind::Refused;
       if (!metadata) {
         item.reason = "its metadata: " + metadata.error().message;
       } else if (!isWhole && !item.metadata) {
         item.reason = "its metadata may be in the rest of the archive";
       } else {
-        item.kind = Kind::kContent;
+        item.kind = Kind::Content;
       }
     } else if (archive.failure().empty()) {
-      item.kind = Kind::kRefused;
+      item.kind = Kind::Refused;
       item.content.clear();
       item.reason = format("has more than %zu bytes", limits::kLogBytes);
     } else {

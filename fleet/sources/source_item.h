@@ -12,14 +12,14 @@ namespace tavrel::fleet {
 
 struct SourceItem {
   enum class Kind : std::uint8_t {
-    kFile,     ///< the file `path`
-    kContent,  ///< the bytes in `content`
-    kRefused,  ///< a log that cannot be obtained
-    kSkipped,  ///< something that cannot be a log, such as a link
-    kOther,    ///< a log of another kind
-    kTooNew,   ///< a log whose metadata may still follow
+    File,     // the file `path`
+    Content,  // the bytes in `content`
+    Refused,  // a log that cannot be obtained
+    Skipped,  // something that cannot be a log, such as a link
+    Other,    // a log of another kind
+    TooNew,   // a log whose metadata may still follow
   };
-  Kind kind = Kind::kFile;
+  Kind kind = Kind::File;
   std::string name;     // for people: a path, or "ARCHIVE: MEMBER"
   std::string path;     // of `kFile`
   std::string content;  // of `kContent`

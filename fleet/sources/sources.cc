@@ -34,32 +34,32 @@ std::string cannot(std::string_view what, int code = errno) {
   return format("cannot be %s: %s", what, systemText(code));
 }
 
-enum class FileType : std::uint8_t { kRegular, kFolder, kLink, kOther };
+enum class FileType : std::uint8_t { Regular, Folder, Link, Other };
 
 FileType typeOf(mode_t mode) {
-  return S_ISREG(mode)   ? FileType::kRegular
-         : S_ISDIR(mode) ? FileType::kFolder
-         : S_ISLNK(mode) ? FileType::kLink
-                         : FileType::kOther;
+  return S_ISREG(mode)   ? FileType::Regular
+         : S_ISDIR(mode) ? FileType::Folder
+         : S_ISLNK(mode) ? FileType::Link
+                         : FileType::Other;
 }
 
 FileType typeOf(int folder, const dirent& entry) {
   switch (entry.d_type) {
     case DT_REG:
-      return FileType::kRegular;
+      return FileType::Regular;
     case DT_DIR:
-      return FileType::kFolder;
+      return FileType::Folder;
     case DT_LNK:
-      return FileType::kLink;
+      return FileType::Link;
     case DT_UNKNOWN: {
       struct stat status {};
       if (fstatat(folder, entry.d_name, &status, AT_SYMLINK_NOFOLLOW) == 0) {
         return typeOf(status.st_mode);
       }
-      return FileType::kOther;
+      return FileType::Other;
     }
     default:
-      return FileType::kOther;
+      return FileType::Other;
   }
 }
 
@@ -80,11 +80,11 @@ class Visit {
       return true;
     });
     // A log whose sidecar is not seen would be filed without its metadata.
-    if (code != 0) return give(sink_, Kind::kRefused, path, cannot("listed", code));
+    if (code != 0) return give(sink_, Kind::Refused, path, cannot("listed", code));
     std::ranges::sort(entries, {}, &Entry::name);
     for (const Entry& entry : entries) {
       const std::string inner = path.ends_with('/') ? path + entry.name : path + '/' + entry.name;
-      if (entry.type == FileType::kFolder) {
+      if (entry.type == FileType::Folder) {
         // The file system's own, which only root may list.
         if (entry.name == "lost+found") continue;
         subfolder(opened.get(), entry.name, inner, depth);
@@ -108,9 +108,9 @@ class Visit {
     if (line != nullptr && !hasSidecar) item.metadata = *line;
     // With a sidecar, the thread that reads it decides.
     if (!hasSidecar && isOtherLog(name, line)) {
-      item.kind = Kind::kOther;
+      item.kind = Kind::Other;
     } else if (!hasSidecar && line == nullptr && mayLineFollow(path)) {
-      item.kind = Kind::kTooNew;
+      item.kind = Kind::TooNew;
     }
     sink_(std::move(item));
   }
@@ -132,20 +132,20 @@ class Visit {
   }
 
   bool isRegular(const Entry& entry, const std::string& path) {
-    if (entry.type == FileType::kRegular) return true;
-    give(sink_, Kind::kSkipped, path,
-         entry.type == FileType::kLink ? "is a symbolic link" : "is not a regular file");
+    if (entry.type == FileType::Regular) return true;
+    give(sink_, Kind::Skipped, path,
+         entry.type == FileType::Link ? "is a symbolic link" : "is not a regular file");
     return false;
   }
 
   void subfolder(int parent, const std::string& name, const std::string& path, std::size_t depth) {
     if (depth == limits::kFolderDepth) {
-      return give(sink_, Kind::kRefused, path,
+      return give(sink_, Kind::Refused, path,
                   format("is nested in more than %zu folders", limits::kFolderDepth));
     }
     Descriptor opened(
         openat(parent, name.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC));
-    if (!opened) return give(sink_, Kind::kRefused, path, cannot("opened"));
+    if (!opened) return give(sink_, Kind::Refused, path, cannot("opened"));
     if (!isLeftOut(opened)) folder(path, opened, depth + 1);
   }
 
@@ -166,14 +166,14 @@ class Visit {
 void visitSources(const std::string& path, const UploadLines& lines, const SourceSink& sink,
                   const std::optional<std::string>& leftOut) {
   struct stat status {};
-  if (stat(path.c_str(), &status) != 0) return give(sink, Kind::kRefused, path, cannot("found"));
+  if (stat(path.c_str(), &status) != 0) return give(sink, Kind::Refused, path, cannot("found"));
   Visit visit(lines, sink, leftOut);
   if (S_ISDIR(status.st_mode)) {
     Descriptor opened(open(path.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC));
-    if (!opened) return give(sink, Kind::kRefused, path, cannot("opened"));
+    if (!opened) return give(sink, Kind::Refused, path, cannot("opened"));
     visit.folder(path, opened, 0);
   } else if (!S_ISREG(status.st_mode)) {
-    give(sink, Kind::kRefused, path, "is not a regular file");
+    give(sink, Kind::Refused, path, "is not a regular file");
   } else if (isArchiveName(path)) {
     visitArchive(path, lines, sink);
   } else {

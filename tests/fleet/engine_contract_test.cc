@@ -21,11 +21,11 @@ class EngineContract : public testing::TestWithParam<bool> {
   EngineContract() {
     if (GetParam()) server_.emplace();
   }
-  std::unique_ptr<Engine> open(OpenMode mode = OpenMode::kWrite,
+  std::unique_ptr<Engine> open(OpenMode mode = OpenMode::Write,
                                const std::string& name = "fleet") const {
     return openEngine(server_ ? server_->address(name) : root_.root.path("/" + name), mode);
   }
-  std::unique_ptr<Engine> openOther() const { return open(OpenMode::kWrite, "other"); }
+  std::unique_ptr<Engine> openOther() const { return open(OpenMode::Write, "other"); }
 
  private:
   const TemporaryRoot root_;
@@ -54,7 +54,7 @@ TEST_P(EngineContract, HandsOutWhatWasAppended) {
                   {"h", 0.1, 1e300, "(0.1, 1e+300]", 0}};
   EXPECT_EQ(open()->append({&record, 1}).added, 1u);
 
-  const auto engine = open(OpenMode::kRead);
+  const auto engine = open(OpenMode::Read);
   std::vector<std::string> keys;
   for (const Key& key : engine->keys())
     keys.push_back(std::to_string(static_cast<int>(key.kind)) + key.name);

@@ -24,12 +24,12 @@ std::string failureOf(const std::function<void()>& operation) {
   return "no failure";
 }
 
-std::string openingFailure(const std::string& where, OpenMode mode = OpenMode::kWrite) {
+std::string openingFailure(const std::string& where, OpenMode mode = OpenMode::Write) {
   return failureOf([&] { openEngine(where, mode); });
 }
 
 void appendInPortions(const std::string& where, const std::vector<LogRecord>& records) {
-  const auto engine = openEngine(where, OpenMode::kWrite);
+  const auto engine = openEngine(where, OpenMode::Write);
   for (std::size_t first = 0; first < records.size(); first += 8)
     engine->append(std::span(records).subspan(first, 8));
 }
@@ -38,13 +38,13 @@ void appendInPortions(const std::string& where, const std::vector<LogRecord>& re
 void killLoaders(const std::function<std::string(std::size_t)>& whereOf) {
   const std::vector<LogRecord> all = fullRecords(16);
   appendInPortions(whereOf(0), all);
-  const auto whole = rowsIn(*openEngine(whereOf(0), OpenMode::kRead));
+  const auto whole = rowsIn(*openEngine(whereOf(0), OpenMode::Read));
   ASSERT_EQ(whole.size(), 112u);
   std::size_t kills = 0;
   for (std::size_t calls = 1; kills < 100; calls += 1 + calls / 12, ++kills) {
     const std::string where = whereOf(calls);
     if (!runUntilSystemCall(calls, [&] { appendInPortions(where, all); })) break;
-    const auto engine = openEngine(where, OpenMode::kWrite);
+    const auto engine = openEngine(where, OpenMode::Write);
     const auto left = rowsIn(*engine);
     EXPECT_EQ(left.size() % 56, 0u) << calls;
     EXPECT_THAT(left, IsSubsetOf(whole)) << calls;
@@ -76,11 +76,11 @@ TEST(EngineFaults, LeavesFilesAloneThatAreNotItsOwn) {
   };
   const auto expectRefusal = [&](const std::string& failure) {
     const std::string before = contentOf(std::filesystem::path(path));
-    EXPECT_EQ(openingFailure(path, OpenMode::kRead), path + failure);
+    EXPECT_EQ(openingFailure(path, OpenMode::Read), path + failure);
     EXPECT_EQ(openingFailure(path), path + failure);
     EXPECT_EQ(contentOf(std::filesystem::path(path)), before);
   };
-  EXPECT_EQ(openingFailure(path, OpenMode::kRead),
+  EXPECT_EQ(openingFailure(path, OpenMode::Read),
             path + ": there is no database: load logs into it first");
   EXPECT_FALSE(std::filesystem::exists(path));
   ASSERT_EQ(mkfifo(root.root.path("/pipe").c_str(), 0600), 0);
@@ -99,7 +99,7 @@ TEST(EngineFaults, LeavesFilesAloneThatAreNotItsOwn) {
   sql("CREATE TABLE t(a)");
   expectRefusal(": is another program's database: name another file");
   std::filesystem::remove(path);
-  openEngine(path, OpenMode::kWrite);
+  openEngine(path, OpenMode::Write);
   sql("PRAGMA user_version = 7; PRAGMA journal_mode = DELETE");
   expectRefusal(
       ": has tables of version 7, and this program knows version 1: use the program that made it, "
@@ -114,7 +114,7 @@ TEST(EngineFaults, TakesEachNameForThatOfAFile) {
     std::size_t rows = 0;
     EXPECT_EQ(failureOf([&] {
                 appendInPortions(name, fullRecords(8));
-                rows = rowsIn(*openEngine(name, OpenMode::kRead)->reader()).size();
+                rows = rowsIn(*openEngine(name, OpenMode::Read)->reader()).size();
               }),
               "no failure");
     EXPECT_EQ(rows, 56u) << name;
@@ -133,7 +133,7 @@ TEST(EngineFaults, LetsOtherUsersQuery) {
   const auto failureOfAnother = [&] {
     EXPECT_EQ(seteuid(65534), 0);
     const std::string failure =
-        failureOf([&] { EXPECT_EQ(rowsIn(*openEngine(path, OpenMode::kRead)).size(), 56u); });
+        failureOf([&] { EXPECT_EQ(rowsIn(*openEngine(path, OpenMode::Read)).size(), 56u); });
     EXPECT_EQ(seteuid(0), 0);
     return failure;
   };
@@ -177,7 +177,7 @@ TEST(EngineFaults, NamesWhatIsWrongWithAnAddress) {
 TEST(EngineFaults, TellsWhatTheServerSays) {
   const ClickhouseServer server;
   const std::string address = server.address("d");
-  EXPECT_EQ(openingFailure(address, OpenMode::kRead),
+  EXPECT_EQ(openingFailure(address, OpenMode::Read),
             address + ": there are no tables: load logs into it first");
   EXPECT_THAT(openingFailure(server.address("d", "fleet:wrong@")),
               HasSubstr(address + ": the server refused: "));
@@ -198,7 +198,7 @@ TEST(EngineFaults, TellsWhatTheServerSays) {
 TEST(EngineFaults, WaitsForAServerThatStartsAgain) {
   ClickhouseServer server;
   const std::vector<LogRecord> all = fullRecords(400);
-  const auto engine = openEngine(server.address("d"), OpenMode::kWrite);
+  const auto engine = openEngine(server.address("d"), OpenMode::Write);
   for (std::size_t first = 0; first < all.size(); first += 8) {
     std::jthread starter;
     if (first % 128 == 64) {
@@ -209,7 +209,7 @@ TEST(EngineFaults, WaitsForAServerThatStartsAgain) {
   }
   const TemporaryRoot root;
   appendInPortions(root.root.path("/d"), all);
-  EXPECT_EQ(rowsIn(*engine), rowsIn(*openEngine(root.root.path("/d"), OpenMode::kRead)));
+  EXPECT_EQ(rowsIn(*engine), rowsIn(*openEngine(root.root.path("/d"), OpenMode::Read)));
   server.end();
   EXPECT_THAT(
       openingFailure(server.address("d") + "?retries=1"),
@@ -268,7 +268,7 @@ TEST(EngineFaults, TakesRowsOnlyWhole) {
   });
   std::string name = server.url();
   name = "clickhouse" + name.substr(4, name.rfind('/') - 3) + "d";
-  const auto engine = openEngine(name, OpenMode::kRead);
+  const auto engine = openEngine(name, OpenMode::Read);
   using namespace std::string_literals;
   const std::string block = "\2\2\4kind\5UInt8\0\1\4name\6String\1a\2bc"s;
   const std::pair<std::string, std::string> cases[] = {

@@ -62,19 +62,19 @@ inline std::vector<std::string> rowsIn(Engine& engine) {
   };
   for (const Key& key : engine.keys()) {
     engine.scalars(key.name, [&](std::span<const ScalarValue> rows) {
-      if (key.kind == KeyKind::kScalar)
+      if (key.kind == KeyKind::Scalar)
         for (const ScalarValue& row : rows)
           add(row.log, key.name + "=" + std::to_string(row.value));
     });
     engine.distributions(key.name, [&](std::span<const DistributionValue> rows) {
-      if (key.kind == KeyKind::kDistribution)
+      if (key.kind == KeyKind::Distribution)
         for (const auto& [log, five] : rows)
           add(log, key.name + ":" + bitsOf(five.minimum) + "," + bitsOf(five.maximum) + "," +
                        bitsOf(five.mean) + "," + bitsOf(five.squaredDeviations) + "," +
                        std::to_string(five.count));
     });
     engine.cells(key.name, [&](std::span<const CellValue> rows) {
-      if (key.kind == KeyKind::kHistogram)
+      if (key.kind == KeyKind::Histogram)
         for (const auto& [log, lower, upper, count] : rows)
           add(log,
               key.name + "(" + bitsOf(lower) + "," + bitsOf(upper) + "]" + std::to_string(count));

@@ -27,7 +27,7 @@ TEST(EngineTables, AnswerTheSameStatementsOnBothEngines) {
   const std::string path = root.root.path("/d");
   const ClickhouseServer server;
   for (const std::string& where : {path, server.address("d")})
-    openEngine(where, OpenMode::kWrite)->append(fullRecords(600));
+    openEngine(where, OpenMode::Write)->append(fullRecords(600));
   for (const char* end : {"", "-wal", "-shm"})
     EXPECT_EQ(std::filesystem::status(path + end).permissions(), std::filesystem::perms{0640});
   sqlite3* connection = nullptr;
@@ -59,23 +59,23 @@ TEST(EngineTables, AreSharedByTheServersOfACluster) {
   const std::string address = one.address("d") + "?cluster=pair";
   std::string failure;
   try {
-    openEngine(address, OpenMode::kWrite);
+    openEngine(address, OpenMode::Write);
   } catch (const EngineError& error) {
     failure = error.what();
   }
   EXPECT_EQ(failure, one.address("d") +
                          ": not all servers of cluster pair have the tables: load into each one "
                          "once, without \"cluster\" in the address");
-  openEngine(two.address("d"), OpenMode::kWrite)->append(fullRecords(20));
-  const auto engine = openEngine(address, OpenMode::kWrite);
+  openEngine(two.address("d"), OpenMode::Write)->append(fullRecords(20));
+  const auto engine = openEngine(address, OpenMode::Write);
   EXPECT_EQ(engine->append(fullRecords(600)).known, 20u);
   // A loader that knows only one server files logs that another server has.
-  openEngine(one.address("d"), OpenMode::kWrite)->append(fullRecords(40));
+  openEngine(one.address("d"), OpenMode::Write)->append(fullRecords(40));
   EXPECT_NE(one.ask("SELECT count() FROM d.log"), "0\n");
   EXPECT_GT(std::stoi(two.ask("SELECT count() FROM d.log")), 20);
 
   const TemporaryRoot root;
-  const auto file = openEngine(root.root.path("/d"), OpenMode::kWrite);
+  const auto file = openEngine(root.root.path("/d"), OpenMode::Write);
   file->append(fullRecords(600));
   EXPECT_EQ(rowsIn(*engine), rowsIn(*file));
   for (const auto& [question, expected] : kQuestions)

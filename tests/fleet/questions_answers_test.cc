@@ -45,7 +45,7 @@ class TestFleet {
 
  private:
   TemporaryRoot root_;
-  std::unique_ptr<Engine> engine_ = openEngine(root_.root.path("/fleet.db"), OpenMode::kWrite);
+  std::unique_ptr<Engine> engine_ = openEngine(root_.root.path("/fleet.db"), OpenMode::Write);
   std::vector<LogRecord> records_;
   std::deque<LogTable> tables_;
   std::deque<Ledger> ledgers_;
@@ -70,7 +70,7 @@ TEST(ShowTest, TellsOfAScalarAndJoinsSmallGroups) {
   }
   fleet.add(3, "OS 4.9");
   Ledger& ledger = fleet.ledger(5);
-  const ShowRequest request{.key = "s", .by = GroupBy::kRegion};
+  const ShowRequest request{.key = "s", .by = GroupBy::Region};
   const ShowAnswer answer = show(fleet.engine(), ledger, request);
   ASSERT_EQ(answer.sides.size(), 1u);
   const ShowSide& side = answer.sides[0];
@@ -98,8 +98,8 @@ TEST(ShowTest, JoinsTheSameValuesInWhateverOrderTheyWereLoaded) {
   for (int region = 2000; region >= 1000; --region)
     fleet.add(region, "OS", std::to_string(region));
   const LogTable table(fleet.engine());
-  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::kDay, 1).at(1000).name.value, "1975-06-24");
-  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::kRegion, 1).at(999).name.value, "1999");
+  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::Day, 1).at(1000).name.value, "1975-06-24");
+  EXPECT_EQ(groupsOf(table, logsOn(table, {}), GroupBy::Region, 1).at(999).name.value, "1999");
 }
 
 TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
@@ -120,7 +120,7 @@ TEST(ShowTest, MergesDistributionsAndBoundsTheirPercentiles) {
   fleet.add(1, "OS 1").distributions = {{"d", {2, 40, std::nan(""), std::nan(""), 1}}};
   Ledger& ledger = fleet.ledger(5);
   const ShowAnswer answer =
-      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
+      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::Distribution});
   const ShownSet& whole = answer.sides[0].whole;
   EXPECT_EQ(whole.devices, 24u);
   EXPECT_EQ(whole.merged->numbers.count, 87u);
@@ -149,7 +149,7 @@ TEST(ShowTest, InventsNoValuesWhereCountsExceed64Bits) {
   }
   Ledger& ledger = fleet.ledger(5);
   const ShowAnswer answer =
-      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::kDistribution});
+      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::Distribution});
   EXPECT_EQ(answer.sides[0].whole.histogram.pieces.front().lower, 0);
 }
 
@@ -164,8 +164,8 @@ TEST(ShowTest, TellsNoMeanOfFewDevices) {
         .distributions = {{"d", {0, kInfinity, mean, 0, 1}}};
   }
   Ledger& ledger = fleet.ledger(5);
-  const ShowAnswer answer = show(fleet.engine(), ledger,
-                                 {.key = "d", .kind = KeyKind::kDistribution, .by = GroupBy::kOs});
+  const ShowAnswer answer =
+      show(fleet.engine(), ledger, {.key = "d", .kind = KeyKind::Distribution, .by = GroupBy::Os});
   const ShowSide& side = answer.sides[0];
   EXPECT_EQ(side.whole.merged->numbers.mean, (6 + 145 + 245) / 24.0);
   EXPECT_EQ(side.groups[1].merged->numbers.mean, 14.5);
@@ -231,7 +231,7 @@ void expectNothingSmallFollowsFromTwo(const std::vector<Division>& divisions,
 
 std::vector<Division> divisionsOf(Ledger& ledger) {
   std::vector<Division> divisions;
-  for (const GroupBy by : {GroupBy::kOs, GroupBy::kRegion, GroupBy::kDigest, GroupBy::kDay})
+  for (const GroupBy by : {GroupBy::Os, GroupBy::Region, GroupBy::Digest, GroupBy::Day})
     divisions.push_back(
         divide(ledger, "logs",
                groupsOf(ledger.table(), logsOn(ledger.table(), {}), by, ledger.devicesAtLeast())));

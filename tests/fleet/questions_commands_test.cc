@@ -85,7 +85,7 @@ class QuestionCommands : public testing::Test {
   void load(const std::string& where, unsigned seed) {
     std::vector<LogRecord> all = records();
     std::shuffle(all.begin(), all.end(), std::mt19937(seed));
-    openEngine(where, OpenMode::kWrite)->append(all);
+    openEngine(where, OpenMode::Write)->append(all);
   }
   TemporaryRoot root;
   const std::string file = root.root.path("/fleet.db");
@@ -119,7 +119,7 @@ TEST_F(QuestionCommands, TheDashboardAsksWhatTheServerAnswers) {
     for (const char* const key : {"a'b", "a\\", "a\n"})
       all[i].scalars.push_back({key, 1});
   }
-  openEngine(server.address("fleet"), OpenMode::kWrite)->append(all);
+  openEngine(server.address("fleet"), OpenMode::Write)->append(all);
   const auto dashboard =
       nlohmann::json::parse(contentOf(std::string(TAVREL_EXAMPLES) + "/fleet/grafana.json"));
   const auto& lists = dashboard["templating"]["list"];
@@ -205,7 +205,7 @@ TEST_F(QuestionCommands, PagesTellNeighbouringBucketsApart) {
     record.cells = {{kKey, 1000.2, 1000.4, "(1000.2, 1000.4]", 1},
                     {kKey, 1000.4, 1000.6, "(1000.4, 1000.6]", 1}};
   }
-  openEngine(file, OpenMode::kWrite)->append(all);
+  openEngine(file, OpenMode::Write)->append(all);
   const std::string page = run(file, "page -o -").out;
   for (const char* bar : {"\"1000.2 to 1000.4: 20\"", "\"1000.4 to 1000.6: 20\""})
     EXPECT_THAT(page, HasSubstr(std::string("aria-label=") + bar));
@@ -234,7 +234,7 @@ TEST_F(QuestionCommands, PagesAreBounded) {
             {key, lower + 0.0, lower + 1.0, record.texts.keep(std::to_string(lower)), 1});
     }
   }
-  openEngine(file, OpenMode::kWrite)->append(all);
+  openEngine(file, OpenMode::Write)->append(all);
   const std::string page = run(file, "page -o -").out;
   for (const char* text :
        {">tavrel-fleet compare lists 11 more changes.<",
@@ -346,7 +346,7 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   LogRecord rare = makeRecord(1000, 47480);  // of one device, whose clock is wrong
   rare.osVersion = "OS 9";
   rare.scalars = {{"rare", 1}};
-  openEngine(file, OpenMode::kWrite)->append({&rare, 1});
+  openEngine(file, OpenMode::Write)->append({&rare, 1});
   const std::string few =
       " is in no log, or in logs of fewer than 10 devices: tavrel-fleet summary";
   const std::tuple<CommandLine, int, std::string> cases[] = {
@@ -404,7 +404,7 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
     EXPECT_EQ(output.status, 2);
   }
   const std::string empty = root.root.path("/empty.db");
-  openEngine(empty, OpenMode::kWrite);
+  openEngine(empty, OpenMode::Write);
   EXPECT_EQ(run(empty, "summary").error,
             "tavrel-fleet: " + empty + ": holds no logs: load some with tavrel-fleet load\n");
 }

@@ -150,7 +150,8 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
   if (!stored) return context.fail(stored.error().message);
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
   const bool isNamed = !arguments.from.empty();
-  if (!isNamed && stored->isGiven && !stored->firstDay)
+  // No day is earlier than all days, and before the clock is set none can be chosen.
+  if (!isNamed && stored->isGiven && (!stored->firstDay || !currentBootInstant()))
     return printAlreadyAllowed(context, *stored, today);
   const auto first = isNamed ? namedDay(arguments.from, today) : firstDayFromNow(context, today);
   if (!first) {

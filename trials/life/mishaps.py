@@ -51,6 +51,12 @@ class Mishaps(Life):
             "clock first, or give --from DAY\n"), f"{done.status} {done.err}")
         self.clock.set_wrong(-5 * SECONDS_PER_DAY)
         self.allow()
+        self.clock.set_wrong(-(self.clock.true // SECONDS_PER_DAY) * SECONDS_PER_DAY)
+        day = self.model.first_day
+        done = self.device.run("tavrelctl", "allow")
+        expect((done.status, done.out) == (
+            0, f"submission is already allowed from day {day} ({date_text(day)}) on\n"),
+            f"{done.status} {done.out}{done.err}")
         self.clock.set_wrong(0)
 
     def deny(self):

@@ -8,16 +8,16 @@
 namespace tavrel::fleet {
 
 struct ServerAddress {
-  std::string name;  ///< for messages: scheme, host, port and database, without a password
-  std::string url;   ///< of its HTTP interface, with a trailing slash
+  std::string name;  // for messages: scheme, host, port and database, without a password
+  std::string url;   // of its HTTP interface, with a trailing slash
   std::string user;
   std::string password;
-  std::string passwordFile;   ///< the file with the password; empty without one
-  std::string authorityFile;  ///< trusted instead of the system's authorities; empty without one
+  std::string passwordFile;   // the file with the password; empty without one
+  std::string authorityFile;  // trusted instead of the system's authorities; empty without one
   std::string database;
-  std::string cluster;                ///< empty without one
-  std::chrono::seconds timeout{300};  ///< for one request and its answer
-  int retries = 7;                    ///< of a request that fails for a transient reason
+  std::string cluster;                // empty without one
+  std::chrono::seconds timeout{300};  // for one request and its answer
+  int retries = 7;                    // of a request that fails for a transient reason
 };
 
 /// Whether the text looks like the address of a server.

@@ -89,16 +89,16 @@ void ClickhouseAppending::addRows(const LogRecord& record, LogId log) {
          record.configNumber, record.whitelistDigest, record.taskID, record.language,
          record.preferredLanguage, record.region);
   for (const ScalarRow& row : record.scalars) {
-    addKey(KeyKind::kScalar, row.key);
+    addKey(KeyKind::Scalar, row.key);
     putAll(scalars_, row.key, log, row.value);
   }
   for (const auto& [key, five] : record.distributions) {
-    addKey(KeyKind::kDistribution, key);
+    addKey(KeyKind::Distribution, key);
     putAll(distributions_, key, log, five.minimum, five.maximum, five.mean, five.squaredDeviations,
            five.count);
   }
   for (const CellRow& row : record.cells) {
-    addKey(KeyKind::kHistogram, row.key);
+    addKey(KeyKind::Histogram, row.key);
     putAll(cells_, row.key, log, row.lower, row.upper, row.label, row.count);
   }
   for (const ApplicationRow& row : record.applications) {

@@ -41,12 +41,12 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
     std::size_t taken = 0;
     while (taken < bytes.size()) {
       const NativeBlock::Found found = block.find(std::string_view(bytes).substr(taken), kTypes);
-      if (found == NativeBlock::Found::kOther) {
+      if (found == NativeBlock::Found::Other) {
         throw EngineError(server.address().name +
                           ": the answer does not have the requested form; check that this program "
                           "made the tables, and try again");
       }
-      if (found == NativeBlock::Found::kPart) break;
+      if (found == NativeBlock::Found::Part) break;
       visitBlock<Row>(block, visit, fields...);
       taken += block.size();
     }

@@ -43,16 +43,16 @@ NativeBlock::Found NativeBlock::find(std::string_view bytes,
   columns_.clear();
   std::string_view rest = bytes;
   try {
-    if (takeSize(rest) != types.size()) return Found::kOther;
+    if (takeSize(rest) != types.size()) return Found::Other;
     const std::uint64_t rows = takeSize(rest);
     for (const std::string_view type : types) {
       takeBytes(rest, takeSize(rest));  // the column's name
-      if (takeBytes(rest, takeSize(rest)) != type) return Found::kOther;
+      if (takeBytes(rest, takeSize(rest)) != type) return Found::Other;
       // Each value takes at least a byte.
-      if (rest.size() < rows) return Found::kPart;
+      if (rest.size() < rows) return Found::Part;
       columns_.push_back(rest.data());
       if (const std::size_t width = widthOf(type); width != 0) {
-        if (rest.size() / width < rows) return Found::kPart;
+        if (rest.size() / width < rows) return Found::Part;
         takeBytes(rest, rows * width);
       } else {
         for (std::uint64_t row = 0; row < rows; ++row)
@@ -61,12 +61,12 @@ NativeBlock::Found NativeBlock::find(std::string_view bytes,
     }
     rows_ = static_cast<std::size_t>(rows);
   } catch (const TooShort&) {
-    return Found::kPart;
+    return Found::Part;
   } catch (const Malformed&) {
-    return Found::kOther;
+    return Found::Other;
   }
   size_ = bytes.size() - rest.size();
-  return Found::kBlock;
+  return Found::Block;
 }
 
 void NativeBlock::take(const char*& next, std::string_view& text) {

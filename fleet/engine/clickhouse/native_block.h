@@ -36,9 +36,9 @@ constexpr std::string_view columnTypeOf() {
 class NativeBlock {
  public:
   enum class Found : std::uint8_t {
-    kBlock,
-    kPart,   ///< some of its bytes have not arrived yet
-    kOther,  ///< columns of other types, or not a block
+    Block,
+    Part,   // some of its bytes have not arrived yet
+    Other,  // columns of other types, or not a block
   };
 
   /// Looks for a block with columns of these types. The bytes must stay where they are.

@@ -17,7 +17,7 @@ struct ServerError : EngineError {
   static constexpr int kUnknownDatabase = 81;
 
   ServerError(int number, const std::string& text) : EngineError(text), code(number) {}
-  int code;  ///< ClickHouse's error code; 0 when the answer has none
+  int code;  // ClickHouse's error code; 0 when the answer has none
 };
 
 /// The server was unreachable, too slow, or too busy. It may or may not have run the statement.

@@ -25,7 +25,7 @@ std::string databaseFault(const std::string& where) {
 }
 
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode) {
-  const bool writes = mode == OpenMode::kWrite;
+  const bool writes = mode == OpenMode::Write;
   if (isServerAddress(where)) return openClickhouseEngine(where, writes);
   return openSqliteEngine(std::string(where), writes);
 }

@@ -11,8 +11,8 @@
 namespace tavrel::fleet {
 
 enum class OpenMode : std::uint8_t {
-  kRead,   ///< the database must exist
-  kWrite,  ///< makes the database or its tables when they are missing
+  Read,   // the database must exist
+  Write,  // makes the database or its tables when they are missing
 };
 
 /// A readable fault in the text that names a database; empty when there is none. Checks only

@@ -119,9 +119,9 @@ bool Appending::insertLog(const LogRecord& record) {
 void Appending::addRows(const LogRecord& record) {
   const std::int64_t place = log_ - firstLog_;
   for (const ScalarRow& row : record.scalars)
-    scalars_.add(names_.key(KeyKind::kScalar, row.key), place, row.value);
+    scalars_.add(names_.key(KeyKind::Scalar, row.key), place, row.value);
   for (const DistributionRow& row : record.distributions)
-    distributions_.add(names_.key(KeyKind::kDistribution, row.key), place, &row.numbers);
+    distributions_.add(names_.key(KeyKind::Distribution, row.key), place, &row.numbers);
   for (const CellRow& row : record.cells)
     cells_.add(names_.bucket(row), place, static_cast<std::int64_t>(row.count));
   for (const ApplicationRow& row : record.applications) {

@@ -104,7 +104,7 @@ std::int64_t Names::key(KeyKind kind, std::string_view name) {
 }
 
 std::int64_t Names::bucket(const CellRow& cell) {
-  const std::int64_t key = this->key(KeyKind::kHistogram, cell.key);
+  const std::int64_t key = this->key(KeyKind::Histogram, cell.key);
   const std::string_view text = joined(text_, key, cell.label);
   if (const auto known = bucketNumbers_.find(text)) return *known;
   const std::int64_t id = buckets_.next(connection_);

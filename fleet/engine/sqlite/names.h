@@ -59,7 +59,7 @@ class Names {
     /// The number for the next name of the table.
     std::int64_t next(const Connection& connection);
 
-    Statement news;  ///< the rows above ?1: the id, then the texts of the name
+    Statement news;  // the rows above ?1: the id, then the texts of the name
     Statement addition;
     std::int64_t highest = 0;
   };

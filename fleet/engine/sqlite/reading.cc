@@ -171,7 +171,7 @@ void Reading::visitRows(Statement& statement, std::int64_t name, const Visitor<R
 
 void Reading::scalars(std::string_view key, const Visitor<ScalarValue>& visit) {
   const ReadTransaction transaction(connection_);
-  const std::int64_t id = find(KeyKind::kScalar, key);
+  const std::int64_t id = find(KeyKind::Scalar, key);
   if (id == 0) return;
   refreshBlocks();
   visitRows(scalars_, id, visit, [](LogId log, sqlite3_value** values) {
@@ -181,7 +181,7 @@ void Reading::scalars(std::string_view key, const Visitor<ScalarValue>& visit) {
 
 void Reading::distributions(std::string_view key, const Visitor<DistributionValue>& visit) {
   const ReadTransaction transaction(connection_);
-  const std::int64_t id = find(KeyKind::kDistribution, key);
+  const std::int64_t id = find(KeyKind::Distribution, key);
   if (id == 0) return;
   refreshBlocks();
   visitRows(distributions_, id, visit, [](LogId log, sqlite3_value** values) {
@@ -194,7 +194,7 @@ void Reading::distributions(std::string_view key, const Visitor<DistributionValu
 
 void Reading::cells(std::string_view key, const Visitor<CellValue>& visit) {
   const ReadTransaction transaction(connection_);
-  const std::int64_t id = find(KeyKind::kHistogram, key);
+  const std::int64_t id = find(KeyKind::Histogram, key);
   if (id == 0) return;
   refreshBlocks();
   struct Bucket {

@@ -69,7 +69,7 @@ CREATE VIEW applications AS
     ON r.id BETWEEN (b.id << 39) + (a.id << 14) AND (b.id << 39) + (a.id << 14) + 16383;
 )";
 
-enum class Found { kNothing, kDatabase };
+enum class Found { Nothing, Database };
 
 constexpr std::string_view kMagic("SQLite format 3\0", 16);
 constexpr std::size_t kHeaderBytes = 100;
@@ -90,14 +90,14 @@ void checkVersion(const std::string& path, std::int64_t version) {
 // or roll back its changes.
 Found look(const std::string& path) {
   const auto header = readBeginning(path, kHeaderBytes);
-  if (!header || header->empty()) return Found::kNothing;
+  if (!header || header->empty()) return Found::Nothing;
   const auto bytes = asBytes(*header);
   if (bytes.size() < kHeaderBytes || !header->starts_with(kMagic))
     throw EngineError(path + ": is not a database: name another file");
   if (word(bytes, 68) != kApplicationId)
     throw EngineError(path + ": is another program's database: name another file");
   checkVersion(path, word(bytes, 60));
-  return Found::kDatabase;
+  return Found::Database;
 }
 
 // The first transaction uses no write-ahead log, so that the header gets into the file itself.
@@ -116,7 +116,7 @@ void createTables(Connection& connection) {
 
 Connection openFile(const std::string& path, bool writes) {
   const std::string nothing = path + ": there is no database: load logs into it first";
-  if (look(path) == Found::kNothing) {
+  if (look(path) == Found::Nothing) {
     if (!writes) throw EngineError(nothing);
     // An empty file is a new database to SQLite. The files beside it get its mode. When it cannot
     // be made, SQLite says why.
