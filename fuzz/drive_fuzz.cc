@@ -145,7 +145,7 @@ void useMachine(fuzz::Input& input, unsigned choice) {
 // For each drive that it opens, libatasmart compiles the names of drives with quirks again, which
 // would take longer than everything else. This keeps the compiled patterns.
 extern "C" int regcomp(regex_t* made, const char* pattern, int flags) {
-  static std::map<std::pair<std::string, int>, regex_t> known;
+  static auto& known = *new std::map<std::pair<std::string, int>, regex_t>;
   const auto [at, isNew] = known.try_emplace({pattern, flags});
   if (isNew) {
     const auto compile = reinterpret_cast<decltype(&regcomp)>(dlsym(RTLD_NEXT, "regcomp"));

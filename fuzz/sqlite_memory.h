@@ -1,6 +1,6 @@
 // Memory for SQLite, which allocates thousands of blocks for each input: ASan's allocator would
 // take longer than everything else. As there, a block is readable only while it is allocated and
-// only within its bounds.
+// only within its bounds, rounded up to 8 bytes as SQLite's own are.
 #pragma once
 
 #include <cstddef>

@@ -98,13 +98,11 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   std::ofstream(file) << R"(<plist version="1.0"><dict><key>proxy</key><array>
 <string>com.a.</string></array></dict></plist>)";
   const auto live = [](uid_t user) {
-    const pid_t child = start([=] {
+    return untilItStops(start([=] {
       ASSERT_EQ(setuid(user), 0);
       BHClientScalarAdd(BHClientScalarForKey("com.a.early"), 2);
       raise(SIGSTOP);
-    });
-    waitpid(child, nullptr, WUNTRACED);
-    return child;
+    }));
   };
   const pid_t children[] = {live(0), live(13)};
   EXPECT_EQ(foldNow().scalars, 2U);
@@ -115,10 +113,8 @@ TEST_F(FoldTest, UsersRecordTheirKeysAlone) {
   FoldReport unknown = foldNow();
   EXPECT_EQ(unknown.failure.value_or("") + std::to_string(unknown.scalars), "1");
   EXPECT_EQ(unknown.waiting, 1U);
-  for (const pid_t child : children) {
-    kill(child, SIGKILL);
-    waitFor(child);
-  }
+  for (const pid_t child : children)
+    waitFor(child, SIGKILL);
   run([] {
     ASSERT_EQ(setuid(13), 0);
     BHClientScalarAdd(BHClientScalarForKey("com.a.late"), 2);

@@ -132,10 +132,19 @@ TEST(IterationTest, ClonesWhatIsKept) {
 TEST(PairingTest, PairsChannelsAtTheirIndexOrBehindIt) {
   // Channels with names of one letter, the others, and the index of each one's match, "-" for none.
   const std::tuple<std::string_view, std::string_view, std::string_view> kCases[] = {
-      {"abc", "abc", "012"},      {"abc", "acb", "02-"},   {"ab", "ba", "1-"},
-      {"aab", "bba", "2--"},      {"bcb", "abcbc", "123"}, {"abcd", "cdab", "23--"},
-      {"abca", "bacabc", "1423"}, {"dzb", "aacbd", "4--"}, {"dbd", "abcd", "31-"},
-      {"aa", "a", "0-"},          {"ab", "", "--"},        {"", "ab", ""}};
+      {"abc", "abc", "012"},
+      {"abc", "acb", "02-"},
+      {"ab", "ba", "1-"},
+      {"aab", "bba", "2--"},
+      {"bcb", "abcbc", "123"},
+      {"abcd", "cdab", "23--"},
+      {"abca", "bacabc", "1423"},
+      {"dzb", "aacbd", "4--"},
+      {"dbd", "abcd", "31-"},
+      {"aa", "a", "0-"},
+      {"aaab", "babc", "11-2"},
+      {"ab", "", "--"},
+      {"", "ab", ""}};
   const auto samplesOf = [](std::string_view letters) {
     Array samples = Array::create();
     for (std::size_t i = 0; i < letters.size(); ++i) {

@@ -29,18 +29,15 @@ class QuickFileSystem final : public FileSystem {
   int syncFile(int) override { return 0; }
 };
 
-inline FileSystem& quickFiles() {
-  static QuickFileSystem files;
-  return files;
-}
-
 /// The services of one process on a device.
 struct ProcessServices {
-  explicit ProcessServices(const DeviceRoot& root, FileSystem& fileSystem = quickFiles())
-      : preferences(root, fileSystem, coding, clock, log) {}
+  explicit ProcessServices(const DeviceRoot& root, FileSystem* otherFiles = nullptr)
+      : fileSystem(otherFiles ? *otherFiles : files),
+        preferences(root, fileSystem, coding, clock, log) {}
 
   KeptLog log;
   QuickFileSystem files;
+  FileSystem& fileSystem;
   FixedClock clock;
   plist::PlistCoding coding;
   FilePreferences preferences;

@@ -333,8 +333,9 @@ TEST_F(LimitsTest, GoesOnWhenAFileStaysAndHoldsTheLock) {
     bool isLocked = true;
   } stuck(root.path("/var/mobile/Library/Logs/Submission/.lock"));
   for (int day = 24; day <= 27; ++day)
-    write(format("%sS-202611%dT000000Z-00000000.log", kPending, day), "L");
-  limit({{"Pending", Dictionary{{"Days", 2}}}});
+    write(format("%sS-202611%dT000000Z-00000000.log", kPending, day),
+          std::string(day == 24 ? 70'000 : 1, 'L'));
+  limit({{"Pending", Dictionary{{"Days", 2}, {"Bytes", 65'536}}}});
   const TidyReport report = Tidy(root, stuck, coding, preferences, store).run();
   EXPECT_EQ(report.failures,
             Lines{"cannot remove " + root.path(kPending) +

@@ -154,7 +154,7 @@ TEST_F(PreferencesTest, AreOldOrNewAfterEveryFault) {
     };
     strikeEachCall(prepare, [&](const TemporaryRoot& device, FaultyFileSystem& faulty) {
       {
-        Process process(device.root, faulty);
+        Process process(device.root, &faulty);
         int done = makeSteps(process);
         if (faulty.goesOn() && faulty.hasStruck()) {
           EXPECT_TRUE(process.synchronize()) << "recovers by itself";

@@ -20,14 +20,14 @@ const std::string kContent(10'000, 'L');
 constexpr std::int32_t kToday = 20784;  // the day of the fixed clock
 
 struct Service : ProcessServices {
-  explicit Service(const DeviceRoot& root, FileSystem& fileSystem = quickFiles())
-      : ProcessServices(root, fileSystem),
+  explicit Service(const DeviceRoot& root, FileSystem* otherFiles = nullptr)
+      : ProcessServices(root, otherFiles),
         version(root, fileSystem, coding, log),
-        submission(root, services(fileSystem)) {
+        submission(root, services()) {
     store.today = kToday;
   }
 
-  FileSubmission::Services services(FileSystem& fileSystem) {
+  FileSubmission::Services services() {
     return {fileSystem, coding, preferences, preferences, days, version, clock, log};
   }
   void readRowsOf(std::int32_t day) {
@@ -110,7 +110,7 @@ TEST_F(Submission, FilesALogWithItsMetadataAndSendsItOn) {
 TEST_F(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
   const auto prepare = [](const TemporaryRoot& device) { permit(device, true); };
   strikeEachCall(prepare, [](const TemporaryRoot& device, FaultyFileSystem& faulty) {
-    Service service(device.root, faulty);
+    Service service(device.root, &faulty);
     const bool filed = service.file();
     if (!filed) {
       ASSERT_FALSE(service.log.lines.empty());
@@ -264,7 +264,7 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
     }
     const TemporaryRoot& root;
   } damaging(*this);
-  EXPECT_FALSE(Service(root, damaging).submission.isDiagnosticSubmissionEnabled());
+  EXPECT_FALSE(Service(root, &damaging).submission.isDiagnosticSubmissionEnabled());
   EXPECT_EQ(contentOf(root.path(kPermission)), "damaged");
   EXPECT_EQ(files(), before);
 

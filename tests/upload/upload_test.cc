@@ -201,6 +201,7 @@ TEST(Upload, KeepsARefusedLogBesideThoseOfAClockThatWasAhead) {
   for (int second = 10; second < 26; ++second)
     device.add(format("log-tallied-20370101T0000%dZ-5f0c9a1e", second), "refused/");
   device.add(nameOf(1));
+  device.write(kOutbox + nameOf(1) + ".log", std::string(5 << 20, 'x'));  // displaces no others
   const ScriptedServer server([](const std::string&) { return status("422 Unfit"); });
   EXPECT_EQ(device.runAgainst(server), Outcome::Done);
   const Lines names = device.names("refused");

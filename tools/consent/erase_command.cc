@@ -1,18 +1,17 @@
 #include "tools/consent/erase_command.h"
 
 #include <istream>
-#include <limits>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
 
 #include "base/format.h"
-#include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/record_file_name.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
+#include "tools/consent/fold_everything.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
 
@@ -95,23 +94,6 @@ bool isConfirmed(ToolContext& context, const Scope& scope, bool yes) {
   if (answer == "yes") return true;
   context.fail("nothing is erased");
   return false;
-}
-
-/// Moves what programs recorded into the store, in as many folds as that takes. Fails when a fold
-/// leaves as much as the previous one: something else must happen first.
-Status foldEverything(ToolContext& context) {
-  std::uint64_t before = std::numeric_limits<std::uint64_t>::max();
-  while (true) {
-    const FoldReport report = context.linuxPlatform().fold().run();
-    if (report.failure) return Error{*report.failure};
-    if (report.waiting == 0) return Done{};
-    if (report.waiting >= before) {
-      return Error{counted(report.waiting, "segment") +
-                   " cannot be folded now: remove the cause that a line above names, or end the "
-                   "programs that record"};
-    }
-    before = report.waiting;
-  }
 }
 
 /// Removes the files of a folder for which `isMeant` returns true, and counts them.

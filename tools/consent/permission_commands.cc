@@ -8,7 +8,6 @@
 
 #include "base/format.h"
 #include "platform/linux/folding/recorded_history.h"
-#include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
@@ -17,6 +16,7 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
+#include "tools/consent/fold_everything.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"
@@ -35,8 +35,7 @@ struct AllowArguments {
 Expected<std::optional<std::int32_t>> latestRecordedDay(ToolContext& context) {
   // Gives values without a date the day that the clock shows now. A later fold could give them a
   // later day, when the clock is behind now.
-  const FoldReport folded = context.linuxPlatform().fold().run();
-  if (folded.failure) return Error{*folded.failure};
+  if (const Status folded = foldEverything(context); !folded) return folded.error();
   Platform& platform = context.platform();
   const Recorders recorders = Recorders::read(context.root(), context.linuxPlatform().fileSystem(),
                                               platform.propertyLists, platform.log);
@@ -120,7 +119,7 @@ void printAllowed(ToolContext& context, const SubmissionPermission& permission, 
 void printAlreadyAllowed(ToolContext& context, const SubmissionPermission& permission,
                          std::int32_t today) {
   printAllowed(context, permission, false);
-  if (permission.firstDay && *permission.firstDay - 1 > today) {
+  if (permission.firstDay && *permission.firstDay - 1 > today && currentBootInstant()) {
     context.note(
         format("today is %s: 'tavrelctl allow --from DAY' names an earlier day", dayText(today)));
   }
@@ -145,14 +144,19 @@ void noteMissingWhitelist(ToolContext& context) {
   if (whitelist.isMissing) context.note("no log is made yet: " + whitelist.fault);
 }
 
+/// Whether a permission that is given now would begin no earlier.
+bool isEarliest(const SubmissionPermission& stored, std::int32_t today) {
+  if (!stored.isGiven || stored.isHeldBack()) return false;
+  if (!stored.firstDay || *stored.firstDay - std::int64_t{1} <= today) return true;
+  return !currentBootInstant();  // before the clock is set, no first day can be chosen
+}
+
 void allow(ToolContext& context, const AllowArguments& arguments) {
   const auto stored = storedSubmissionPermission(context.preferences());
   if (!stored) return context.fail(stored.error().message);
   const std::int32_t today = context.platform().statistics->BHDaysSince1970();
   const bool isNamed = !arguments.from.empty();
-  // No day is earlier than all days, and before the clock is set none can be chosen.
-  if (!isNamed && stored->isGiven && (!stored->firstDay || !currentBootInstant()))
-    return printAlreadyAllowed(context, *stored, today);
+  if (!isNamed && isEarliest(*stored, today)) return printAlreadyAllowed(context, *stored, today);
   const auto first = isNamed ? namedDay(arguments.from, today) : firstDayFromNow(context, today);
   if (!first) {
     const std::string& fault = first.error().message;

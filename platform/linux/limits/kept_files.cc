@@ -168,7 +168,7 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds) {
   KeptUse left = use();
   const auto staying = beginOfStaying();
   // While a file that alone exceeds the bound is there, removing others does not help: it goes
-  // before them or, when it stays, does not count.
+  // before them or, when it stays or cannot be removed, does not count.
   std::int64_t stayingBytes = 0;
   for (const KeptFile& file : std::ranges::subrange(staying, list_.end()))
     stayingBytes += file.bytes;
@@ -192,8 +192,11 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds) {
       if (!file.companion.empty()) companions.push_back(file.companion);
     } else {
       if (trimmed.status) trimmed.status = removed;
-      // Removing all others would not bring them within the bound.
-      if (stuckBytes += file.bytes; stuckBytes > bounds.bytes) break;
+      if (file.bytes > bounds.bytes) {
+        left.bytes -= file.bytes;
+      } else if (stuckBytes += file.bytes; stuckBytes > bounds.bytes) {
+        break;  // removing all others would not bring them within the bound
+      }
     }
   }
   if (Status removed = removeCompanions(companions); trimmed.status) trimmed.status = removed;

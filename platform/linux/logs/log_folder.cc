@@ -107,9 +107,11 @@ Status LogFolder::keepNewest(std::size_t count, std::uint64_t bytes, std::string
   std::uint64_t bytesKept = 0;
   for (const auto& [seconds, name] : logs) {
     const auto status = FileSystem::status(logPath(name));
-    bytesKept += status ? static_cast<std::uint64_t>(status->st_size) : 0;
+    const std::uint64_t size = status ? static_cast<std::uint64_t>(status->st_size) : 0;
+    // A log that alone exceeds the bound displaces no others.
+    if (size <= bytes) bytesKept += size;
     ++kept;
-    if (name == fresh || (kept <= count && bytesKept <= bytes)) continue;
+    if (name == fresh || (kept <= count && size <= bytes && bytesKept <= bytes)) continue;
     if (Status removed = removeLog(name); !removed && outcome) outcome = removed;
   }
   return outcome;
