@@ -279,9 +279,10 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
 TEST_F(Submission, FilesNothingWhenThePermissionGoesMeanwhile) {
   Service service(root);
   // Withdrawn, and given again for later days.
-  for (const auto& [isGiven, firstDay] : {std::pair(false, plist::Value()), {true, kToday + 1}}) {
+  for (const bool isGiven : {false, true}) {
     permit(*this, true);
     service.readRowsOf(kToday - 1);
+    const plist::Value firstDay = isGiven ? plist::Value(kToday + 1) : plist::Value();
     EXPECT_FALSE(service.submission.ZTXWriteLogForSubmission(
         "193", "log-tallied", {}, [&](LogFile&) { permit(*this, isGiven, firstDay); }));
     EXPECT_EQ(service.log.lines.back(),

@@ -2,8 +2,8 @@
 
 #include <algorithm>
 #include <map>
-#include <ranges>
 #include <set>
+#include <span>
 
 #include "base/civil_time.h"
 #include "platform/linux/device/ecc_events.h"
@@ -170,18 +170,17 @@ TrimmedFiles KeptFiles::trim(const Bounds& bounds) {
   // While a file that alone exceeds the bound is there, removing others does not help: it goes
   // before them or, when it stays or cannot be removed, does not count.
   std::int64_t stayingBytes = 0;
-  for (const KeptFile& file : std::ranges::subrange(staying, list_.end()))
+  for (const KeptFile& file : std::span(staying, list_.end()))
     stayingBytes += file.bytes;
   if (stayingBytes > bounds.bytes) left.bytes -= stayingBytes;
-  std::ranges::stable_partition(list_.begin(), staying, [&bounds](const KeptFile& file) {
-    return file.bytes > bounds.bytes;
-  });
+  std::stable_partition(list_.begin(), staying,
+                        [&bounds](const KeptFile& file) { return file.bytes > bounds.bytes; });
   std::map<std::int64_t, std::size_t> filesOfDays;
   for (const KeptFile& file : list_)
     ++filesOfDays[file.day()];
   std::vector<std::string> companions;
   std::int64_t stuckBytes = 0;
-  for (const KeptFile& file : std::ranges::subrange(list_.begin(), staying)) {
+  for (const KeptFile& file : std::span(list_.begin(), staying)) {
     if (left.days <= bounds.days && left.bytes <= bounds.bytes) break;
     // A log that the uploader has sent meanwhile is not lost.
     const bool isThere = FileSystem::status(file.path).has_value();
