@@ -125,6 +125,7 @@ class Years(Mishaps):
 
     def end_of_year(self, year, days):
         self.fold()
+        self.tidy()  # the last day may have put all that segments still hold into a new store
         self.check_statistics()
         figures, memory, descriptors = measured = self.measure()
         self.figures.append(measured)
