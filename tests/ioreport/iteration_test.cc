@@ -127,7 +127,7 @@ TEST(IterationTest, ClonesWhatIsKept) {
   EXPECT_EQ(driver.get("IOReportChannelGroups"), (Dictionary{{"g", aggregateOf(Array::create())}}));
 }
 
-// A channel that is not at its own index is searched for behind it, or behind the last one that was
+// A channel that is not at its own index is searched for after it, or after the last one that was
 // found in this way.
 TEST(PairingTest, PairsChannelsAtTheirIndexOrBehindIt) {
   // Channels with names of one letter, the others, and the index of each one's match, "-" for none.
