@@ -19,6 +19,7 @@ TEST(Base64, RefusesWrongLengthsAndPadding) {
       bytes[i] = static_cast<std::byte>(255 - i);
     std::string text = "\n ";
     appendBase64(text, bytes);
+    text.insert(std::min<std::size_t>(text.size(), 3), "\n ");  // within a group
     EXPECT_TRUE(readBase64(text, read));
     EXPECT_EQ(read, bytes);
   }

@@ -107,8 +107,8 @@ TEST(Value, WritingThroughAnEmptyHandleGivesItAContainer) {
   Array array;
   array.append(1);
   array.append(2);
-  array.set(9, "beyond");
-  array.remove(9);
+  array.set(2, "beyond");
+  array.remove(2);
   array.remove(0);
   EXPECT_EQ(Value(array), Value(Array{2}));
 }

@@ -149,6 +149,9 @@ TEST_F(TaskingTest, SubmitsAtOnceForSomeDaysAfterAnUpdate) {
   const std::string tooLong(1048259, 'x');
   schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", tooLong)}}});
   EXPECT_EQ(track(), Journal{"submit now"});
+  // So does one that this run applies.
+  schedule({{"TaskingID", "two"}, {"TaskingPayload", Array{setting("a", "k", 1)}}});
+  EXPECT_EQ(track().back(), "submit now");
 }
 
 }  // namespace

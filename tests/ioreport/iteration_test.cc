@@ -1,5 +1,6 @@
 #include <gtest/gtest.h>
 
+#include "base/limits.h"
 #include "reporting.h"
 
 namespace tavrel {
@@ -61,8 +62,12 @@ TEST(IterationTest, FailsForMalformedAggregates) {
   Dictionary endless = Dictionary::create();
   endless.set("IOReportDrivers", Dictionary{{"a", endless}, {"b", endless}});
   Dictionary deep = letters("a");
-  for (int i = 0; i < 200; ++i)
-    deep = Dictionary{{"IOReportChannelGroups", Dictionary{{"g", deep}}}};
+  Dictionary deepest;
+  for (std::size_t i = 0; i < limits::kPropertyListDepth; ++i) {
+    deepest = deep;
+    deep = Dictionary{{"IOReportChannelGroups", Dictionary{{"g", deepest}}}};
+  }
+  EXPECT_EQ(IOReportGetChannelCount(deepest), 1);
   const auto drivers = [](const Value& levels) { return Dictionary{{"IOReportDrivers", levels}}; };
   for (const Dictionary& aggregate :
        {Dictionary(), endless, deep, aggregateOf({5}), aggregateOf(5), drivers(5),

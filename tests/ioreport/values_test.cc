@@ -301,8 +301,8 @@ struct FakeWriter : DescriptorWriter {
 TEST(DescriptionTest, WritesTextsWithOneCall) {
   FakeWriter writer;
   using Case = std::pair<std::ptrdiff_t, KernelReturn>;
-  for (const auto& [answer, code] :
-       {Case(4, 0), Case(3, kKernelUnderrun), Case(5, kKernelError), Case(-1, kKernelIOError)}) {
+  for (const auto& [answer, code] : {Case(4, 0), Case(3, kKernelUnderrun), Case(0, kKernelUnderrun),
+                                     Case(5, kKernelError), Case(-1, kKernelIOError)}) {
     writer.answer = answer;
     EXPECT_EQ(IOReportWriteStringUTF8(writer, 1, "text\0more"s), code);
     EXPECT_EQ(writer.written, "text");
@@ -310,6 +310,8 @@ TEST(DescriptionTest, WritesTextsWithOneCall) {
   IOReportWriteStringUTF8(writer, 1, "a\xff");
   EXPECT_EQ(writer.written, "a\xEF\xBF\xBD");
   EXPECT_EQ(IOReportWriteStringUTF8(writer, 1, std::nullopt), kKernelBadArgument);
+  writer.answer = 0;
+  EXPECT_EQ(IOReportWriteStringUTF8(writer, 1, ""), kKernelSuccess);
 
   LinuxDescriptorWriter system;
   int ends[2];
