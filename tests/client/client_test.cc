@@ -11,6 +11,7 @@
 #include <sys/time.h>
 #include <thread>
 
+#include "base/text.h"
 #include "recording.h"
 
 namespace tavrel {
@@ -18,6 +19,11 @@ namespace {
 
 constexpr int kThreads = 8;
 constexpr int kPerThread = 40'000;
+
+auto openDescriptors() {
+  const std::filesystem::directory_iterator entries("/proc/self/fd");
+  return std::distance(entries, {});
+}
 
 TEST_F(Recording, CountsOfManyThreadsAreExactWhileTheyAreFolded) {
   const pid_t child = start([] {
@@ -220,6 +226,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   const pid_t child = untilItStops(start([&] {
     const auto isFoldWanted = [&] { return std::filesystem::exists(folder / "fold-wanted"); };
     testClock().coarse = 1000;
+    const auto descriptors = openDescriptors();
     int i = 0;
     // Nested signal handlers record while the second chunk is being taken.
     int handlers = 2;
@@ -240,6 +247,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
     const char* text = nullptr;
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusFull);
     EXPECT_STREQ(text, "the segment is full: values are dropped until a fold makes room");
+    EXPECT_EQ(openDescriptors(), descriptors);
     kill(getpid(), SIGSTOP);
     i = 0;
     while (!isFoldWanted() && i < kRoom)
@@ -552,6 +560,12 @@ TEST_F(Recording, AWriterIsSeenUntilItsMappingIsGone) {
   const Descriptor file(open(segment.c_str(), O_RDONLY));
   SegmentFacts facts = SegmentFile(file.get()).facts();
   EXPECT_EQ(facts.pid, static_cast<std::uint32_t>(child));
+  std::string bootId;
+  std::ifstream("/proc/sys/kernel/random/boot_id") >> bootId;
+  std::erase(bootId, '-');
+  std::string inSegment;
+  appendHex(inSegment, facts.boot);
+  EXPECT_EQ(inSegment, bootId);
   EXPECT_EQ(writerOf(segment), WriterPresence::Present);
   EXPECT_EQ(findSegmentProcess(facts), WriterPresence::Present);
   run([&] {  // as another user, from whom /proc hides the process; if root may mount
