@@ -84,7 +84,9 @@ std::chrono::milliseconds Uploader::timeLeft() const {
       configuration_.run - (std::chrono::steady_clock::now() - begin_));
 }
 
+// A log that cannot be sent fails again each time that all logs are listed.
 void Uploader::complain(std::string_view line) {
+  if (!complaints_.emplace(line).second) return;
   services_.log.write(LogLevel::Error, line);
   if (complaint_.empty()) complaint_ = line;
 }

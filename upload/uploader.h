@@ -8,6 +8,7 @@
 #include <chrono>
 #include <cstddef>
 #include <optional>
+#include <set>
 #include <string>
 #include <string_view>
 #include <vector>
@@ -99,6 +100,7 @@ class Uploader {
   bool tried_ = false;
   bool failed_ = false;    // a transfer
   std::string complaint_;  // the first of this run
+  std::set<std::string> complaints_;
 };
 
 }  // namespace tavrel::upload

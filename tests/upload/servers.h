@@ -8,7 +8,9 @@
 #include <sys/socket.h>
 #include <thread>
 
+#include "base/base64.h"
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/digests.h"
 #include "tests/platform/temporary_root.h"
 
 namespace tavrel {
@@ -92,7 +94,7 @@ class Nginx {
 };
 
 /// Receives each request completely and answers with the text from `reply`, in which "DIGEST"
-/// stands for the digest of the request. An empty text closes the connection.
+/// stands for the digest of the content. An empty text closes the connection.
 class ScriptedServer {
  public:
   using Reply = std::function<std::string(const std::string& request)>;
@@ -134,6 +136,7 @@ class ScriptedServer {
   }
   bool answerOne(int client) {
     std::string request;
+    std::size_t body = 0;
     for (std::size_t wanted = std::string::npos; request.size() < wanted;) {
       char piece[65536];
       const ssize_t size = read(client, piece, sizeof piece);
@@ -141,10 +144,13 @@ class ScriptedServer {
       request.append(piece, static_cast<std::size_t>(size));
       const std::size_t head = request.find("\r\n\r\n");
       if (head == request.npos) continue;
-      wanted = readsWhole ? head + 4 + std::stoul("0" + valueOf(request, "Content-Length")) : 0;
+      body = head + 4;
+      wanted = readsWhole ? body + std::stoul("0" + valueOf(request, "Content-Length")) : 0;
     }
     std::string answer = reply_(request);
-    replaceAll(answer, "DIGEST", valueOf(request, "Content-Digest"));
+    std::string digest = "sha-256=:";
+    appendBase64(digest, sha256(asBytes(request).subspan(body)));
+    replaceAll(answer, "DIGEST", digest + ":");
     return !answer.empty() && send(client, answer.data(), answer.size(), MSG_NOSIGNAL) > 0 &&
            !closesAfterAnswer;
   }

@@ -93,8 +93,9 @@ TEST(Upload, WaitsForANetworkThatMayBeUsed) {
   const std::string eth = row("eth0", "00000000", "0003", 100);
   const std::string down = row("wwan0", "00000000", "0002", 1);
   const std::string rejected = row6("ffffffff 00000001 00000000 00200200 lo");
+  const std::string half = zero + " 01 " + row6("1 1 0 00000003 eth0").substr(zero.size() + 4);
   const std::tuple<std::string, std::string, std::string> cases[] = {
-      {head + lan + down, rejected, "there is no default route"},
+      {head + lan + down, rejected + half, "there is no default route"},
       {head + lan + down + eth, rejected, ""},
       {head + eth + row("wwan0", "00000000", "0003", 50), "", "the network is metered (wwan0)"},
       {head + eth + row("wwan0", "00000000", "0003", 700), "", ""},
@@ -200,13 +201,16 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
             "cannot use the client certificate: the credential tavrel-upload.certificate is "
             "missing: give both");
   std::string authorization;
+  std::string encoding;
   ScriptedServer server([&](const std::string& request) {
     authorization = ScriptedServer::valueOf(request, "Authorization");
+    encoding = ScriptedServer::valueOf(request, "Content-Encoding");
     return kOk;
   });
   device.add(nameOf(1));
   EXPECT_EQ(device.runAgainst(server), Outcome::Done);
   EXPECT_EQ(authorization, "Bearer Abc-1==");
+  EXPECT_EQ(encoding, "gzip");
 }
 
 TEST(Upload, TellsTheServiceManagerHowItEnded) {
@@ -215,7 +219,7 @@ TEST(Upload, TellsTheServiceManagerHowItEnded) {
       "<key>URL</key><string>http://127.0.0.1:1/</string><key>AllowPlainHTTP</key><true/>");
   const auto run = [&](const std::string& arguments, const std::string& below = "/") {
     const std::string command = "TAVREL_ROOT=" + device.root.path(below) + " " TAVREL_UPLOAD " " +
-                                arguments + " >/dev/null 2>&1";
+                                arguments + " >" + device.root.path("/said") + " 2>&1";
     return WEXITSTATUS(std::system(command.c_str()));  // NOLINT(cert-env33-c)
   };
   EXPECT_EQ(run(""), 0) << "nothing to do";
@@ -232,6 +236,10 @@ TEST(Upload, TellsTheServiceManagerHowItEnded) {
   EXPECT_EQ(run("", "/missing"), 1);
   device.configure("");
   EXPECT_EQ(run(""), 78);
+  const std::string path = device.root.path(upload::kConfigurationPath);
+  EXPECT_TRUE(
+      contentOf(device.root.path("/said"))
+          .ends_with(" error cannot use " + path + ": URL is missing: give https://HOST/FOLDER\n"));
   EXPECT_EQ(std::tuple(device.state().failedAttempts, device.state().failedTransfers),
             std::tuple(3, 2));
   const auto lock = device.lockRuns();

@@ -357,6 +357,20 @@ TEST(Upload, MakesNoAttemptWhenPackingTakesTheTimeOfARun) {
   }
 }
 
+TEST(Upload, SaysWhatItCannotReadAndSendsTheRest) {
+  Device device;
+  device.add(nameOf(2));
+  const std::string pending = device.root.path(kSubmission + "pending");
+  const std::string noLog = device.root.path(kOutbox + nameOf(1) + ".log");
+  device.write(kSubmission + "pending", "");
+  ASSERT_EQ(mkfifo(noLog.c_str(), 0600), 0);
+  EXPECT_EQ(device.runAgainst(ScriptedServer([](const std::string&) { return kOk; })),
+            Outcome::Failed);
+  EXPECT_EQ(device.log.lines, (Lines{"cannot list " + pending + ": Not a directory",
+                                     "cannot read " + noLog + ": not a regular file",
+                                     "logs sent: 1, refused by the server: 0"}));
+}
+
 TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
   Device device;
   device.add(nameOf(1));
