@@ -60,6 +60,11 @@ TEST(Binary, SmallestFormsAreWrittenAndReadBack) {
       EXPECT_EQ(std::signbit(back->number()->real()), std::signbit(number->real()));
     }
   }
+  // Longer forms are read, too.
+  EXPECT_EQ(*readBinary(asBytes(document({"\x12\0\0\0\7"s}))), Value(7));
+  EXPECT_EQ(*readBinary(asBytes(document({"\x14"s + std::string(15, '\0') + '\7'}))), Value(7));
+  EXPECT_EQ(*readBinary(asBytes(document({"\x14"s + std::string(15, '\xFF') + '\xFE'}))),
+            Value(-2));
 }
 
 TEST(Binary, EqualScalarsAreOneObjectAndKeysAreSorted) {

@@ -55,9 +55,9 @@ TEST(Xml, ScalarsAreWrittenAndReadBack) {
   using Case = std::pair<Value, std::string>;
   for (const auto& [value, text] :
        {Case(INT64_MIN, "<integer>-9223372036854775808</integer>"),
-        Case(UINT64_MAX, "<integer>18446744073709551615</integer>"),
-        Case(0.1F, "<real>0.10000000149011612</real>"), Case(-0.0, "<real>-0</real>"),
-        Case(5e-324, "<real>5e-324</real>"),
+        Case(UINT64_MAX, "<integer>18446744073709551615</integer>"), Case(true, "<true/>"),
+        Case(false, "<false/>"), Case(0.1F, "<real>0.10000000149011612</real>"),
+        Case(-0.0, "<real>-0</real>"), Case(5e-324, "<real>5e-324</real>"),
         Case(-std::numeric_limits<double>::quiet_NaN(), "<real>nan</real>"),
         Case(Date::ofDay(INT32_MIN), "<date>-5877641-06-23T00:00:00Z</date>"),
         Case(Data(asBytes("ab")), "<data>\nYWI=\n</data>"),
