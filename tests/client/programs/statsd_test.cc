@@ -127,7 +127,8 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   const std::string path = root / "statsd.sock";
   auto unixSocket = openUnixSocket(path);
   auto loopback = openLoopbackSocket(0);
-  ASSERT_TRUE(unixSocket && loopback);
+  auto unused = openLoopbackSocket(0);
+  ASSERT_TRUE(unixSocket && loopback && unused);
   EXPECT_EQ(std::filesystem::status(path).permissions(), std::filesystem::perms{0666})
       << "every user may send";
   sockaddr_in address{};
@@ -144,10 +145,11 @@ TEST_F(Statsd, TakesSocketsOfTheServiceManagerAndEndsWhenIdle) {
   const pid_t child = start([&] {
     dup2(unixSocket->descriptor(), 100);
     dup2(loopback->descriptor(), 101);
-    dup2(100, 3);
-    dup2(101, 4);
+    dup2(unused->descriptor(), 3);
+    dup2(100, 4);
+    dup2(101, 5);
     setenv("LISTEN_PID", std::to_string(getpid()).c_str(), 1);
-    setenv("LISTEN_FDS", "2", 1);
+    setenv("LISTEN_FDS", "3", 1);
     execl(kProgram.c_str(), "tavrel-statsd", "--idle", "1", "--udp", "1", nullptr);
   });
   EXPECT_EQ(waitFor(child), 0);
