@@ -71,7 +71,9 @@ TEST_F(CompletionTest, HasEveryCommandAndOption) {
     EXPECT_EQ(std::system(parses.c_str()), 0) << shell;
     ++shells;
   }
-  expectIn(device.run("completion zsh").out, {"'(--root)--root=[Folder that holds", "--day=["});
+  expectIn(device.run("completion zsh").out,
+           {"'(--root)--root=[Folder that holds", "--day=[",
+            "'(--bool --string --int --float --date --plist)--bool[true, yes"});
   EXPECT_EQ(device.run("--help").out.find("completion"), std::string::npos);
   if (shells == 0) GTEST_SKIP() << "neither fish nor zsh: their syntax is not checked";
 }

@@ -108,6 +108,11 @@ TEST_F(StatImport, ExportGivesBackWhatWasImported) {
   EXPECT_EQ(other.json("stat list d"), R"({"format_version": 1, "scalars": [], "distributions": [
       {"key": "d", "day": 1, "date": "1970-01-02", "count": 1}]})"_json);
   other.check("stat list --day 2", prints("no statistics\n"));
+  other.run("stat import", "scalar\t3\ta key that is cut\t5\n");
+  other.check("stat list a",
+              prints("DAY             KIND    VALUE  KEY\n"
+                     "3 (1970-01-04)  scalar      5  a key that is…\n"),
+              "", 45);
   other.run("stat import", "scalar\ttoday\tt\t1\nscalar\tyesterday\tt\t2\n");
   EXPECT_TRUE(other.run("stat export t --day yesterday").out.ends_with("\tt\t2\n"));
   EXPECT_TRUE(other.run("stat export t --day today").out.ends_with("\tt\t1\n"));

@@ -54,7 +54,9 @@ TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
   for (const char* line : {"0/name POLL", "0/time 25", "1/name C1", "1/time 75"})
     device.write("/sys/devices/system/cpu/cpu0/cpuidle/state" + std::string(line, 6), line + 7);
   expectIn(textOf("--day 20000 --days 400"),
-           {"Device on 2024-10-04", "Trends over 400 days", "POLL 25.0 % 25 µs C1 75.0 % 75 µs"});
+           {"Device on 2024-10-04", "Trends over 400 days",
+            "since the drivers began to count. cpu0.idle_states Residency of",
+            "POLL 25.0 % 25 µs C1 75.0 % 75 µs"});
 }
 
 TEST_F(PageTest, TellsWhatLeaves) {

@@ -187,6 +187,7 @@ Next log        the next run may write one; the last was written 2026-01-01 00:0
   EXPECT_EQ(document["next"], R"({
       "last_logged": "2200-01-01T00:00:00Z", "last_is_in_future": true, "allowed_now": false,
       "allowed_from": "2200-01-08T00:00:00Z"})"_json);
+  EXPECT_EQ(document["log"]["date"], "2026-11-16 18:02:18 +0000");
   EXPECT_EQ(document["log"]["validity"], R"({"ValidityList[0]": [12, -1]})"_json);
   // A log without metadata is recognised by its name.
   const std::string named = outbox + "StorageStatus-9.log";
