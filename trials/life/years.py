@@ -34,7 +34,7 @@ class Years(Mishaps):
                 self.count("days off", hole)
                 day += hole
             day += 1
-            if lived >= min(WARM_UP, days) and not self.figures:
+            if lived >= min(WARM_UP, days // 2) and not self.figures:
                 self.figures.append(self.measure())
             if day >= compare_at:
                 self.check_statistics()
