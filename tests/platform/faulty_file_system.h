@@ -151,7 +151,8 @@ inline void strikeEachCall(
     const std::function<void(const TemporaryRoot&, FaultyFileSystem&)>& work) {
   for (const auto fault : FaultyFileSystem::kFaults) {
     bool hasStruck = true;
-    for (int call = 1; hasStruck && !testing::Test::HasFatalFailure(); ++call) {
+    int call = 1;
+    for (; hasStruck && !testing::Test::HasFatalFailure(); ++call) {
       SCOPED_TRACE(testing::Message() << "fault " << static_cast<int>(fault) << " at " << call);
       ASSERT_LT(call, 200);
       const TemporaryRoot device;
@@ -160,6 +161,7 @@ inline void strikeEachCall(
       work(device, faulty);
       hasStruck = faulty.hasStruck();
     }
+    EXPECT_GT(call, 2) << "no call was struck";
   }
 }
 
