@@ -22,6 +22,8 @@ class BlockDevice:
 
     def __enter__(self):
         signal.signal(signal.SIGTERM, lambda *_: sys.exit(1))
+        if not shutil.which("mkfs.ext4"):
+            raise SystemExit("bench: there is no mkfs.ext4: install e2fsprogs")
         self.folder = tempfile.mkdtemp(prefix="tavrel_flash.")
         self.mounted = os.path.join(self.folder, "mounted")
         self.loop = self.reason = None
@@ -35,7 +37,7 @@ class BlockDevice:
             # The kernel detaches a loop device that mount has made when it is unmounted.
             call("mount", "-o", "loop,noatime", image, self.mounted)
             self.loop = call("findmnt", "--noheadings", "--output", "SOURCE", self.mounted)
-        except (OSError, subprocess.CalledProcessError) as error:
+        except (PermissionError, subprocess.CalledProcessError) as error:
             lines = (getattr(error, "stderr", "") or str(error)).splitlines()
             self.reason = lines[0] if lines else str(error)
             return None
