@@ -89,7 +89,10 @@ class Receiver:
 
     def __init__(self, device, *command):
         self.socket = socket.socket(socket.AF_INET, socket.SOCK_DGRAM)
-        self.socket.setsockopt(socket.SOL_SOCKET, SO_RCVBUFFORCE, RECEIVE_BUFFER)
+        try:
+            self.socket.setsockopt(socket.SOL_SOCKET, SO_RCVBUFFORCE, RECEIVE_BUFFER)
+        except PermissionError:
+            raise SystemExit("recording_runs: needs root for a large receive buffer") from None
         self.socket.bind(("127.0.0.1", 0))
         self.process = os.fork()
         if self.process == 0:
@@ -179,8 +182,8 @@ def statsd(bin_directory, wanted):
 def main():
     wanted = Wanted()
     additions(sys.argv[1], wanted)
-    statsd(sys.argv[1], wanted)
     samples(sys.argv[1], wanted)
+    statsd(sys.argv[1], wanted)
     sys.exit(wanted.status())
 
 
