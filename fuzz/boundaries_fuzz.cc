@@ -5,23 +5,20 @@
 #include <algorithm>
 #include <bit>
 #include <cstdint>
-#include <cstdlib>
 #include <limits>
 #include <numeric>
 #include <vector>
 
 #include "base/bytes.h"
 #include "report/histogram.h"
+#include "require.h"
 
 using namespace tavrel;
+using fuzz::require;
 
 namespace {
 
 constexpr std::size_t kBoundaryBytes = 9;
-
-void require(bool condition) {
-  if (!condition) std::abort();
-}
 
 /// Adds a boundary to the list, and the number that it compares as; a boundary that is
 /// not a number stops no value.

@@ -9,16 +9,14 @@
 #include <cstdlib>
 #include <string>
 
+#include "require.h"
 #include "storage/counter_parsers.h"
 #include "storage/hex_string.h"
 
 namespace {
 
 using namespace tavrel;
-
-void require(bool condition) {
-  if (!condition) std::abort();
-}
+using fuzz::require;
 
 struct CountingStreams : StandardStreams {
   std::size_t bytes = 0;

@@ -1,8 +1,10 @@
 // Reads hostile logs. What the fast XML reader accepts, the full reader must read into the same
-// record; records must be sorted, and reading twice must give the same record.
+// record; rows must be sorted, no statistic may come twice, and reading twice must give the same
+// record.
 #include <algorithm>
 #include <cstdint>
 #include <cstdlib>
+#include <functional>
 
 #include "fleet/logs/expat_xml.h"
 #include "fleet/logs/log_reader.h"
@@ -17,7 +19,12 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   static LogReader reader;
   const auto record = reader.read(bytes, nullptr);
   if (record) {
-    if (!std::ranges::is_sorted(record->scalars, {}, &ScalarRow::key)) std::abort();
+    const auto isInOrder = [](const auto& rows) {
+      return std::ranges::adjacent_find(rows, std::ranges::greater_equal{},
+                                        [](const auto& row) { return row.key; }) == rows.end();
+    };
+    if (!isInOrder(record->scalars) || !isInOrder(record->distributions)) std::abort();
+    if (!std::ranges::is_sorted(record->cells, {}, &CellRow::key)) std::abort();
     const auto again = reader.read(bytes, nullptr);
     if (!again || again->digest != record->digest) std::abort();
   } else if (record.error().message.empty() ||

@@ -5,16 +5,17 @@
 // one item: three bits for its type, two for its identifier, three for its payload's length.
 #include <algorithm>
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <string>
 #include <vector>
 
+#include "require.h"
 #include "storage/vm_freezer.h"
 
 namespace {
 
 using namespace tavrel;
+using fuzz::require;
 
 constexpr std::uint32_t kTypes[] = {0x13, 0x14, 0x13, 0x14, 0x909, 0x901, 0x20, 0xF19158ED};
 constexpr char kName[] = "VM_swapout";
@@ -86,10 +87,6 @@ struct Reference {
   }
 };
 
-void expect(bool holds) {
-  if (!holds) std::abort();
-}
-
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
@@ -102,13 +99,13 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   std::optional<std::size_t> stop;
   ByteSpan position;
   const bool isThere = Reference{items}.find(0, expected, stop);
-  expect(getIOStatsWithThreadnameFromKCDataHelper(items, kName, found, &position) == isThere);
-  expect(found.has_value() == expected.has_value());
-  if (found) expect(found->data() == expected->data() && found->size() == expected->size());
+  require(getIOStatsWithThreadnameFromKCDataHelper(items, kName, found, &position) == isThere);
+  require(found.has_value() == expected.has_value());
+  if (found) require(found->data() == expected->data() && found->size() == expected->size());
   if (stop) {
-    expect(position.data() == items.data() + *stop && position.size() == items.size() - *stop);
+    require(position.data() == items.data() + *stop && position.size() == items.size() - *stop);
   } else {
-    expect(position.data() == nullptr);
+    require(position.data() == nullptr);
   }
   return 0;
 }

@@ -2,7 +2,6 @@
 // or in a memory file with some of the seals.
 #include <array>
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <fcntl.h>
 #include <memory>
@@ -13,16 +12,14 @@
 #include "base/limits.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/service/service_message.h"
+#include "require.h"
 
 namespace {
 
 using tavrel::ByteSpan;
+using tavrel::fuzz::require;
 
 constexpr int kAllSeals = F_SEAL_SHRINK | F_SEAL_GROW | F_SEAL_WRITE;
-
-void require(bool holds) {
-  if (!holds) std::abort();
-}
 
 /// Both ends of one connection serve all inputs; nothing in it may be left for a later input.
 struct Connection {

@@ -1,4 +1,4 @@
-// The check that all targets use: a condition that does not hold is a finding.
+// A condition that does not hold is a finding.
 #pragma once
 
 #include <cstdlib>

@@ -47,8 +47,9 @@ void limit(std::vector<std::uint8_t>& bytes, std::size_t at, std::uint32_t most)
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  if (size == 0) return 0;
   static const int file = memfd_create("segment", MFD_CLOEXEC);
-  if (size == 0 || ftruncate(file, 0) != 0 || ftruncate(file, kBHSegmentBytes) != 0) return 0;
+  if (ftruncate(file, 0) != 0 || ftruncate(file, kBHSegmentBytes) != 0) std::abort();
   const std::uint8_t options = *data++;
   --size;
   std::vector<std::uint8_t> bytes(data, data + size);

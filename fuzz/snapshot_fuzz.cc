@@ -4,20 +4,17 @@
 // Input: capacity and size of the descriptor (16 bits each), the descriptor, the records. The
 // capacity's highest bit chooses the renderer, its lowest bit a text that is cut.
 #include <cstdint>
-#include <cstdlib>
 #include <string>
 #include <vector>
 
+#include "require.h"
 #include "storage/parse/snapshot_descriptor.h"
 #include "storage/parse/snapshot_text.h"
 
 namespace {
 
 using namespace tavrel;
-
-void expect(bool holds) {
-  if (!holds) std::abort();
-}
+using fuzz::require;
 
 // Enough for inputs of a few kB; cutting a longer text tests just as much.
 constexpr std::size_t kRoom = 1U << 16;
@@ -32,7 +29,7 @@ template <class Render>
 Rendered renderInto(std::size_t capacity, Render render) {
   Rendered out{0, capacity, std::vector<char>(capacity, '#')};
   out.answer = render(std::span(out.text), out.length);
-  if (out.answer != 1) expect(out.answer == 0 && out.length == capacity);
+  if (out.answer != 1) require(out.answer == 0 && out.length == capacity);
   return out;
 }
 
@@ -44,19 +41,19 @@ template <class Render>
 void checkCapacities(std::size_t capacity, Render render) {
   const Rendered whole = renderInto(kRoom, render);
   const bool isWhole = whole.answer == 1;
-  expect(!isWhole || (whole.length < kRoom && whole.text[whole.length] == '\0'));
+  require(!isWhole || (whole.length < kRoom && whole.text[whole.length] == '\0'));
   const std::size_t length = isWhole ? whole.length : kRoom - 1;
   if (isWhole && capacity % 2 == 0) {
     const Rendered exact = renderInto(length + 1, render);
-    return expect(exact.answer == 1 && textOf(exact, length + 1) == textOf(whole, length + 1));
+    return require(exact.answer == 1 && textOf(exact, length + 1) == textOf(whole, length + 1));
   }
   if (isWhole) capacity = capacity / 2 % (length + 1);
   if (capacity > length) return;
   const Rendered cut = renderInto(capacity, render);
-  expect(cut.answer == 0);
+  require(cut.answer == 0);
   if (capacity == 0) return;
-  expect(cut.text[capacity - 1] == '\0');
-  expect(textOf(cut, capacity - 1) == textOf(whole, capacity - 1));
+  require(cut.text[capacity - 1] == '\0');
+  require(textOf(cut, capacity - 1) == textOf(whole, capacity - 1));
 }
 
 }  // namespace
@@ -87,9 +84,9 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   if (layout) {
     checkCapacities(room, inPlace);
   } else {
-    expect(!layout.error().message.empty());
+    require(!layout.error().message.empty());
     const Rendered refused = renderInto(16, inPlace);
-    expect(refused.answer == 0 && textOf(refused, 16) == std::string(16, '#'));
+    require(refused.answer == 0 && textOf(refused, 16) == std::string(16, '#'));
   }
   return 0;
 }

@@ -1,11 +1,11 @@
 // Statistics buffers of any bytes: the parser must find what a plain walk over the records finds,
 // both lists must stay in step, and the NAND information can be built from whatever they hold.
 #include <cstdint>
-#include <cstdlib>
 #include <cstring>
 #include <memory>
 #include <vector>
 
+#include "require.h"
 #include "storage/nand_info.h"
 #include "storage/nand_info_keys.h"
 #include "storage/parse/asp_parser.h"
@@ -14,10 +14,7 @@
 namespace {
 
 using namespace tavrel;
-
-void require(bool condition) {
-  if (!condition) std::abort();
-}
+using fuzz::require;
 
 struct NoPreferences : Preferences {
   plist::Value ZTXPreferencesGetValue(std::string_view, std::string_view) override { return {}; }

@@ -1,16 +1,14 @@
 // Datagrams of StatsD lines, passed through their parser and the recorder.
 #include <cmath>
 #include <cstdint>
-#include <cstdlib>
 
+#include "require.h"
 #include "statsd/statsd_line.h"
 #include "statsd/statsd_recorder.h"
 
 namespace {
 
-void require(bool holds) {
-  if (!holds) std::abort();
-}
+using tavrel::fuzz::require;
 
 void checkLine(std::string_view text) {
   tavrel::StatsdLine line;

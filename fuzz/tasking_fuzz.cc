@@ -1,7 +1,6 @@
 // Tasking payloads with any content. One run must apply what the payload says and nothing else, a
 // second run must change nothing, and a run with another tasking must revert the settings and leave
 // the rest. Each domain is synchronised once, the daemon's own last.
-#include <cstdlib>
 #include <map>
 #include <set>
 #include <string>
@@ -10,9 +9,11 @@
 #include "platform/persisted_state.h"
 #include "platform/plist/coding.h"
 #include "plist_mutator.h"
+#include "require.h"
 #include "tests/fakes/fake_platform.h"
 
 using namespace tavrel;
+using fuzz::require;
 
 namespace {
 
@@ -20,10 +21,6 @@ using Domains = std::map<std::string, std::map<std::string, plist::Value>>;
 
 constexpr std::string_view kBystander = "a key that stays";
 constexpr std::string_view kSynchronize = "synchronize ";
-
-void require(bool condition) {
-  if (!condition) std::abort();
-}
 
 void schedule(fakes::FakePlatform& fake, const plist::Dictionary& tasking) {
   fake.preferences.domain(kScheduleDomain).set(kScheduledTaskingKey, tasking);

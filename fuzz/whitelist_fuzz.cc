@@ -1,26 +1,23 @@
 // A whitelist of any bytes: loading and checking it must end properly, and what the tool explains
 // must agree with what the daemon decides.
-#include <cstdlib>
 #include <string>
 
 #include "config/bh_config.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
 #include "plist_mutator.h"
+#include "require.h"
 #include "tools/overlay/overlay_platform.h"
 #include "tools/whitelist/whitelist_check.h"
 #include "tools/whitelist/whitelist_model.h"
 #include "tools/whitelist/whitelist_rules.h"
 
 using namespace tavrel;
+using fuzz::require;
 
 namespace {
 
 constexpr std::size_t kComparedRules = 200;
-
-void require(bool condition) {
-  if (!condition) std::abort();
-}
 
 void compare(const WhitelistRules& rules, const plist::Dictionary& found, std::string_view key) {
   const WhitelistRule* const rule = rules.ofKey(key);
