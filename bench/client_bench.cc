@@ -39,16 +39,20 @@ class Device {
   }
   ~Device() { std::filesystem::remove_all(root_); }
 
-  /// Aborts when values were dropped, because the figures would then measure something different.
+  /// Aborts when values were dropped, or the library made no segment, because the figures would
+  /// then measure something different.
   void fold() {
     const std::scoped_lock lock(mutex_);
+    bool hasSegment = false;
     for (const auto& entry : std::filesystem::directory_iterator(root_ / "run/tavrel/stat")) {
       if (entry.path().extension() != ".segment") continue;
+      hasSegment = true;
       const Descriptor file(open(entry.path().c_str(), O_RDWR | O_CLOEXEC));
       NoSink sink;
       const SegmentProgress progress = SegmentReader(file.get()).read(position_, 0, false, sink);
       if (!acknowledge(file.get(), progress) || progress.dropped != 0) std::abort();
     }
+    if (!hasSegment) std::abort();
   }
 
  private:
@@ -100,6 +104,7 @@ void add(benchmark::State& state) {
   static BHClientScalarKey* const key = BHClientScalarForKey("bench.add");
   for (auto _ : state)
     BHClientScalarAdd(key, 1);
+  device().fold();
 }
 
 void set(benchmark::State& state) {
@@ -107,6 +112,7 @@ void set(benchmark::State& state) {
   static BHClientScalarKey* const key = BHClientScalarForKey("bench.set");
   for (auto _ : state)
     BHClientScalarSet(key, 1);
+  device().fold();
 }
 
 struct FloorRecord {

@@ -1,5 +1,6 @@
 // The report: summaries and histograms over packed values, whitelist look-ups, and coarsening.
 #include <benchmark/benchmark.h>
+#include <cstdlib>
 #include <filesystem>
 #include <random>
 #include <string>
@@ -37,10 +38,12 @@ struct Device {
 
   Device() {
     auto batch = linuxPlatform.store().beginBatch();
+    if (!batch) std::abort();
+    bool done = true;
     for (const double value : randomValues(kValues)) {
-      static_cast<void>((*batch)->appendValue(kDay, "distribution", 0, value));
+      done = done && (*batch)->appendValue(kDay, "distribution", 0, value);
     }
-    static_cast<void>((*batch)->commit());
+    if (!done || !(*batch)->commit()) std::abort();
   }
   ~Device() { std::filesystem::remove_all(root); }
 };
@@ -90,11 +93,14 @@ void distributionFromStore(benchmark::State& state) {
   if (state.range(0) > 0) options.set("intervals", ascending(state.range(0)));
   const auto history = device.linuxPlatform.store().initWithDefaultPath();
   for (auto _ : state) {
+    bool found = false;
     history->distributionsForKeyPrefix(
         "", kDay - 1, kDay,
         [&](std::string_view key, std::int32_t, BHHistoryDistributionEnumerator& values, bool&) {
+          found = true;
           report.computeAndAddDistribution(values, key, options);
         });
+    if (!found) std::abort();
   }
   state.SetItemsProcessed(state.iterations() * static_cast<std::int64_t>(kValues));
 }

@@ -34,11 +34,12 @@ PENDING = "var/mobile/Library/Logs/Submission/pending"
 
 
 class Device:
-    """A device root in a temporary folder."""
+    """A device root in a temporary folder, which goes at the end of the program at the latest."""
 
     def __init__(self, bin_directory):
         self.bin = os.path.abspath(bin_directory)
-        self.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.")
+        self.folder = tempfile.TemporaryDirectory(prefix="tavrel_whole_runs.")
+        self.root = self.folder.name
         self.environment = {"PATH": os.environ["PATH"], "TAVREL_ROOT": self.root}
         self.tool("prefs", "set", "com.norvane.zentrix", "DiagnosticSubmissionEnabled", "true",
                   "--bool")
@@ -46,7 +47,8 @@ class Device:
     def copy(self, folder=None):
         """Makes another device with the same content, below a folder that the caller chooses."""
         twin = copy.copy(self)
-        twin.root = tempfile.mkdtemp(prefix="tavrel_whole_runs.", dir=folder)
+        twin.folder = tempfile.TemporaryDirectory(prefix="tavrel_whole_runs.", dir=folder)
+        twin.root = twin.folder.name
         twin.environment = {**self.environment, "TAVREL_ROOT": twin.root}
         shutil.copytree(self.root, twin.root, dirs_exist_ok=True)
         return twin
@@ -75,7 +77,7 @@ class Device:
             raise SystemExit(f"{filed} logs were filed, not {count}")
 
     def close(self):
-        shutil.rmtree(self.root)
+        self.folder.cleanup()
 
 
 def run_once(command, environment):
@@ -175,6 +177,10 @@ def nothing_to_do(bin_directory, wanted):
     print("\nA gated run with nothing to do")
     device = Device(bin_directory)
     run_once(device.daemon("-d"), device.environment)
+    said = subprocess.run(device.daemon("-d"), env=device.environment, check=True, text=True,
+                          capture_output=True).stderr
+    if "Day unchanged since last run" not in said:  # a failing run ends with 0, too
+        raise SystemExit(f"tavrel -d does something else than nothing: {said}")
     empty = [os.path.join(device.bin, "tavrel_empty")]
     median, floor, _ = measure("tavrel -d", device.daemon("-d"), device.environment,
                                ("an empty program", empty), runs=200)
