@@ -8,6 +8,7 @@
 #include "support.h"
 #include "tools/stat/collect_sources.h"
 #include "tools/stat/collect_state.h"
+#include "tools/stat/machine_statistics.h"
 #include "upload/network.h"
 
 using namespace tavrel;
@@ -37,7 +38,18 @@ void collect(fuzz::Tree& tree, fuzz::Input& input, unsigned first) {
   const MachineReading again = sources.read(Processes::LeftOut);
   require(again.cpu.has_value() == reading.cpu.has_value() && again.cpus == reading.cpus);
   require(again.memoryTotalKib == reading.memoryTotalKib && !again.processes);
-  if (reading.cpu) require(again.cpu->total == reading.cpu->total);
+  if (reading.cpu) {
+    require(again.cpu->total == reading.cpu->total && reading.cpu->busy <= reading.cpu->total);
+  }
+  if (reading.memoryTotalKib) require(reading.memoryAvailableKib <= reading.memoryTotalKib);
+  if (reading.diskTotalMib) require(reading.diskFreeMib <= reading.diskTotalMib);
+  MachineReading start;
+  start.cpu = {0, 0};
+  for (const MachineStatistic& statistic : machineStatistics()) {
+    const auto number = statistic.measure(reading, &start, 1);
+    if (number && std::string_view(statistic.key).ends_with("_percent"))
+      require(*number >= 0 && *number <= 100);
+  }
 
   CollectState state;
   state.machine = reading;

@@ -11,6 +11,7 @@
 #include "tools/stat/collect_state.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/import_number.h"
+#include "tools/stat/machine_statistics.h"
 #include "tools/stat/value_summary.h"
 
 namespace tavrel {
@@ -538,6 +539,32 @@ TEST_F(SamplerTest, CollectsWhatTheMachineTells) {
             "load.one_minute=0.25 memory.used_percent=75 memory.used_percent=75 "
             "network.received_kib_per_second=1.5 network.sent_kib_per_second=2.5 "
             "temperature.celsius=41.5 temperature.celsius=41.5 ");
+}
+
+TEST(MachineSources, LeaveOutWhatCannotBe) {
+  const TemporaryDevice device;
+  const std::string most = "18446744073709551615";
+  device.write("/proc/stat", "cpu  1 0 0 " + most + " 0\n");
+  device.write("/proc/meminfo", "MemAvailable: 5 kB\nMemTotal: 4 kB\n");
+  device.write("/proc/net/dev", "\n\na: " + most + " 0 0 0 0 0 0 0 7 0\nb: 1 0 0 0 0 0 0 0 9 0\n");
+  device.write("/proc/diskstats", "8 0 sda 1 1 36028797018963968 1 1 1 2 1\n");
+  device.write("/sys/block/sda/device/x", "");
+  KeptLog log;
+  MachineReading reading = MachineSources(device.root, log).read(Processes::LeftOut);
+  EXPECT_FALSE(reading.cpu || reading.memoryAvailableKib || reading.disk);
+  ASSERT_TRUE(reading.network);
+  EXPECT_EQ(std::pair(std::to_string(reading.network->in), reading.network->out),
+            std::pair(most, std::uint64_t{7}));
+
+  // The kernel may take back waiting time, so that busy time grows by more than the total.
+  MachineReading before;
+  before.cpu = {0, 0};
+  reading.cpu = {100, 98};
+  for (const MachineStatistic& statistic : machineStatistics()) {
+    if (std::string_view(statistic.key).ends_with("busy_percent")) {
+      EXPECT_EQ(statistic.measure(reading, &before, 1), 100);
+    }
+  }
 }
 
 TEST_F(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {

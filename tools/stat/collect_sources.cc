@@ -11,6 +11,7 @@
 #include <utility>
 #include <vector>
 
+#include "base/arithmetic.h"
 #include "base/ascii.h"
 #include "base/limits.h"
 #include "platform/linux/files/folder_walk.h"
@@ -76,6 +77,17 @@ std::optional<Number> firstNumber(std::string_view text) {
   return fields.empty() ? std::nullopt : numberOf<Number>(fields[0]);
 }
 
+// Adds the counters of a device. Leaves it out when they are unknown or too large for a sum.
+void addDevice(std::optional<MachineReading::Traffic>& traffic, std::optional<std::uint64_t> in,
+               std::optional<std::uint64_t> out) {
+  MachineReading::Traffic sum = traffic.value_or(MachineReading::Traffic{0, 0});
+  if (!in || !out || __builtin_add_overflow(sum.in, *in, &sum.in) ||
+      __builtin_add_overflow(sum.out, *out, &sum.out)) {
+    return;
+  }
+  traffic = sum;
+}
+
 std::optional<std::uint64_t> countProcesses(const DeviceRoot& root) {
   std::uint64_t count = 0;
   const int code = walkFolder(root.pathOrMachine("/proc"), [&](const dirent& entry) {
@@ -95,9 +107,12 @@ void readDataFolder(const DeviceRoot& root, MachineReading& reading) {
     if (!folder.has_relative_path()) return;
     folder = folder.parent_path();
   }
-  const auto mib = [&](std::uint64_t blocks) { return blocks * status.f_frsize >> 20; };
+  const auto mib = [&](std::uint64_t blocks) -> std::optional<std::uint64_t> {
+    const auto bytes = checkedMultiply(blocks, status.f_frsize);
+    return bytes ? std::optional(*bytes >> 20) : std::nullopt;
+  };
   reading.diskTotalMib = mib(status.f_blocks);
-  reading.diskFreeMib = mib(status.f_bavail);
+  if (status.f_bavail <= status.f_blocks) reading.diskFreeMib = mib(status.f_bavail);
 }
 
 }  // namespace
@@ -140,8 +155,7 @@ void MachineSources::readCpu(MachineReading& reading) {
   MachineReading::CpuTicks ticks{0, 0};
   for (std::size_t i = 1; i < all.size() && i <= kStolen; ++i) {
     const auto part = numberOf<std::uint64_t>(all[i]);
-    if (!part) return;
-    ticks.total += *part;
+    if (!part || __builtin_add_overflow(ticks.total, *part, &ticks.total)) return;
     if (i != kIdle && i != kWaiting) ticks.busy += *part;
   }
   reading.cpu = ticks;
@@ -162,6 +176,8 @@ void MachineSources::readMemory(MachineReading& reading) {
     if (fields[0] == "SwapTotal:") swapTotal = kib;
     if (fields[0] == "SwapFree:") swapFree = kib;
   }
+  if (reading.memoryTotalKib && reading.memoryAvailableKib > reading.memoryTotalKib)
+    reading.memoryAvailableKib.reset();
   if (swapTotal && swapFree && *swapFree <= *swapTotal)
     reading.swapUsedKib = *swapTotal - *swapFree;
 }
@@ -182,12 +198,8 @@ std::optional<MachineReading::Traffic> MachineSources::readNetwork() {
     const Fields name(line.substr(0, colon));
     const Fields fields(line.substr(colon + 1));
     if (name.size() != 1 || name[0] == "lo" || fields.size() <= kSent) continue;
-    const auto in = numberOf<std::uint64_t>(fields[kReceived]);
-    const auto out = numberOf<std::uint64_t>(fields[kSent]);
-    if (!in || !out) continue;
-    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
-    traffic->in += *in;
-    traffic->out += *out;
+    addDevice(traffic, numberOf<std::uint64_t>(fields[kReceived]),
+              numberOf<std::uint64_t>(fields[kSent]));
   }
   return traffic;
 }
@@ -197,19 +209,17 @@ std::optional<MachineReading::Traffic> MachineSources::readDisks() {
   constexpr std::size_t kName = 2;
   constexpr std::size_t kRead = 5;
   constexpr std::size_t kWritten = 9;
-  constexpr std::uint64_t kSector = 512;
+  const auto bytesOf = [](std::string_view sectors) {
+    const auto count = numberOf<std::uint64_t>(sectors);
+    return count ? checkedMultiply(*count, 512) : std::nullopt;
+  };
   std::string_view rest = contentOf("/proc/diskstats");
   std::optional<MachineReading::Traffic> traffic;
   while (!rest.empty()) {
     const Fields fields(takeLine(rest));
     if (fields.size() <= kWritten) continue;
     if (!isDisk(fields[kName])) continue;
-    const auto in = numberOf<std::uint64_t>(fields[kRead]);
-    const auto out = numberOf<std::uint64_t>(fields[kWritten]);
-    if (!in || !out) continue;
-    if (!traffic) traffic.emplace(MachineReading::Traffic{0, 0});
-    traffic->in += *in * kSector;
-    traffic->out += *out * kSector;
+    addDevice(traffic, bytesOf(fields[kRead]), bytesOf(fields[kWritten]));
   }
   return traffic;
 }

@@ -1,5 +1,7 @@
 #include "tools/stat/machine_statistics.h"
 
+#include <algorithm>
+
 namespace tavrel {
 namespace {
 
@@ -43,7 +45,8 @@ std::optional<double> busyPercent(const MachineReading& now, const MachineReadin
   if (!busy) return std::nullopt;
   const auto total = growth(now.cpu->total, before->cpu->total);
   if (!total || *total <= 0) return std::nullopt;
-  return 100 * *busy / *total;
+  // The kernel may take back waiting time; the total then grows by less than its busy part.
+  return 100 * std::min(*busy / *total, 1.0);
 }
 
 constexpr auto kNetwork = &MachineReading::network;

@@ -1,4 +1,5 @@
 // Sources that count files or make system calls: the boot, and the mounted file systems.
+#include <algorithm>
 #include <linux/magic.h>
 #include <string>
 #include <sys/stat.h>
@@ -70,11 +71,14 @@ void measureFileSystem(const std::string& mountPoint, std::span<std::int64_t> sl
   struct statvfs status {};
   if (statvfs(mountPoint.c_str(), &status) != 0 || status.f_blocks == 0) return;
   slots[kSize] = inBytes(status.f_blocks, status.f_frsize);
-  slots[kUsed] = inBytes(status.f_blocks - status.f_bfree, status.f_frsize);
-  slots[kAvailable] = inBytes(status.f_bavail, status.f_frsize);
-  const double used = static_cast<double>(slots[kUsed]);
-  const double usable = used + static_cast<double>(slots[kAvailable]);
-  if (usable > 0) slots[kUsedPercent] = static_cast<std::int64_t>(100 * used / usable);
+  // A file system that claims to have more free than there is says nothing about its use.
+  if (std::max(status.f_bfree, status.f_bavail) <= status.f_blocks) {
+    slots[kUsed] = inBytes(status.f_blocks - status.f_bfree, status.f_frsize);
+    slots[kAvailable] = inBytes(status.f_bavail, status.f_frsize);
+    const double used = static_cast<double>(slots[kUsed]);
+    const double usable = used + static_cast<double>(slots[kAvailable]);
+    if (usable > 0) slots[kUsedPercent] = static_cast<std::int64_t>(100 * used / usable);
+  }
   // Some file systems allocate inodes on demand and have no total.
   if (status.f_files == 0) return;
   slots[kFiles] = inBytes(status.f_files, 1);
