@@ -10,10 +10,12 @@
 #include <nlohmann/json.hpp>
 #include <sstream>
 #include <string>
+#include <sys/inotify.h>
 #include <unistd.h>
 #include <vector>
 
 #include "base/format.h"
+#include "platform/linux/files/descriptor.h"
 #include "platform/plist/xml.h"
 #include "tests/fakes/command_line.h"
 #include "tests/platform/temporary_root.h"
@@ -47,6 +49,27 @@ inline std::string xmlOf(std::string_view json) {
   EXPECT_TRUE(value) << value.error().message;
   return *plist::writeXml(*value);
 }
+
+/// Counts how often a file is opened.
+class Openings {
+ public:
+  explicit Openings(const std::string& path) {
+    // Equal events in a row become one, so closing has events, too.
+    EXPECT_GE(inotify_add_watch(events_.get(), path.c_str(), IN_OPEN | IN_CLOSE), 0) << path;
+  }
+
+  /// Since the last call.
+  int take() {
+    int count = 0;
+    inotify_event event{};
+    while (::read(events_.get(), &event, sizeof event) == sizeof event)
+      count += (event.mask & IN_OPEN) != 0 ? 1 : 0;
+    return count;
+  }
+
+ private:
+  const Descriptor events_{inotify_init1(IN_NONBLOCK | IN_CLOEXEC)};
+};
 
 struct Outcome {
   int status;

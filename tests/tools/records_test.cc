@@ -94,6 +94,9 @@ TEST(Records, ReaderHandsOutEachLineOnceWhateverItsLength) {
   EXPECT_EQ(read("new\ntorn", false), (std::vector<std::string>{"1new"}));
   EXPECT_EQ(read("new\n", false), std::vector<std::string>());  // the writer has truncated the end
   EXPECT_EQ(read("new\nlonger\n", false), (std::vector<std::string>{"2longer"}));
+  Openings opened(reader.path());
+  EXPECT_TRUE(reader.read(false, [](std::string_view, std::uint64_t) { ADD_FAILURE(); }));
+  EXPECT_EQ(opened.take(), 0);  // it has not grown
 }
 
 // Calls a hook whenever output is flushed.

@@ -9,6 +9,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/files/file_system.h"
 #include "platform/linux/files/system_error.h"
 #include "tools/shared/json_value.h"
 #include "tools/shared/table.h"
@@ -22,6 +23,11 @@ constexpr std::size_t kBlockBytes = 64U << 10;
 }  // namespace
 
 Status RecordReader::read(bool isComplete, const LineHandler& handler) {
+  // Of a folder's files, few have grown since the last call.
+  if (const auto seen = FileSystem::status(path_);
+      seen && S_ISREG(seen->st_mode) && seen->st_size == offset_) {
+    return Done{};
+  }
   const Descriptor file(open(path_.c_str(), O_RDONLY | O_NONBLOCK | O_NOCTTY | O_CLOEXEC));
   struct stat status {};
   if (!file || fstat(file.get(), &status) != 0) return systemError("read", path_);
