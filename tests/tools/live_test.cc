@@ -295,11 +295,14 @@ TEST(LiveTest, ARootShowsOnlyItsOwnFolders) {
 
 TEST(LiveTest, DrivesAsleepAreNotRead) {
   const LiveDevice device({{kHwmon + "hwmon0/",
-                            "name=drivetemp,temp1_input=30000,"
+                            "name=drivetemp,temp1_input=30000,temp1_lowest=20000,"
                             "device/power/runtime_status=suspended"}});
   EXPECT_EQ(device.values(), "");
   device.write(kHwmon + "hwmon0/device/power/runtime_status", "active\n");
-  EXPECT_EQ(device.values(), "drivetemp.temp1=30000 sensors.hottest=30000 ");
+  Openings asked(device.path(kHwmon + "hwmon0/device/power/runtime_status"));
+  EXPECT_EQ(device.values(),
+            "drivetemp.temp1=30000 drivetemp.temp1_lowest=20000 sensors.hottest=30000 ");
+  EXPECT_EQ(asked.take(), 1);  // not for each figure
 }
 
 // A recording plays back the same values, in place of the live services.

@@ -165,10 +165,15 @@ class LiveMachine::State {
     std::vector<LiveFile>& files = source.files();
     std::optional<std::string_view> text;
     const std::string* textPath = nullptr;
+    const LiveFile* asked = nullptr;  // the last one whose device was asked whether it is asleep
+    bool sleeps = false;
     for (std::size_t i = 0; i < wanted.size(); ++i) {
       if (!wanted[i]) continue;
       if (files[i].speed == Speed::Slow) {
-        if (isAsleep(files[i])) {
+        // The files of a device follow one another.
+        if (!asked || asked->powerStatus != files[i].powerStatus) sleeps = isAsleep(files[i]);
+        asked = &files[i];
+        if (sleeps) {
           source.takeText(i, std::nullopt);
         } else {
           slow.emplace_back(index, i);
