@@ -38,7 +38,7 @@ TEST(LabelTest, AreDifferentForDifferentBytes) {
 }
 
 TEST(MetricPageTest, WritesFamiliesAsBothFormatsHaveThem) {
-  MetricPage page;
+  MetricPage page, full;
   page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "2"}}, 0.5);
   page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "1\"\\"}}, std::int64_t{9007199254740993});
   page.gauge({"b_bytes", "bytes", "Bytes."}, {{"k", "2"}}, 7.0);  // the labels are already used
@@ -54,6 +54,9 @@ TEST(MetricPageTest, WritesFamiliesAsBothFormatsHaveThem) {
             "b_bytes{k=\"1\\\"\\\\\"} 9007199254740993\nb_bytes{k=\"2\"} 0.5\n"
             "# TYPE c summary\n# HELP c Summary.\n"
             "c{quantile=\"0.5\"} 1\nc{quantile=\"1.0\"} -0\nc_sum 1.5\nc_count 3\n# EOF\n");
+  for (std::size_t i = 0; i <= MetricPage::kMetrics; ++i)
+    full.gauge({"a", "", "Many."}, {{"k", std::to_string(i)}}, 0.0);
+  EXPECT_EQ(full.leftOut(), 1U);
 }
 
 TEST(ExportTest, IsAcceptedByBothParsers) {

@@ -100,9 +100,10 @@ class ChannelExport {
     const Elements elements = elementsOfType(channel_, kFormatSimpleArray);
     const std::size_t count = getRawElements(channel_, kFormatSimpleArray).count();
     for (std::size_t i = 0; i < count * kElementValues; ++i) {
+      const std::int64_t value = elements.value(i / kElementValues, i % kElementValues);
+      if (value == kInvalidValue) continue;
       addValue("tavrel_channel_element", "Elements of channels that are arrays.",
-               with("index", std::to_string(i)),
-               elements.value(i / kElementValues, i % kElementValues));
+               with("index", std::to_string(i)), value);
     }
   }
 

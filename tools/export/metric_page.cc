@@ -89,52 +89,53 @@ std::string labelValue(std::string_view bytes) {
   return value;
 }
 
-void MetricPage::add(const MetricFamily& family, std::string_view type, std::string&& labels,
-                     std::string&& lines) {
+template <class Write>
+void MetricPage::add(const MetricFamily& family, std::string_view type, const MetricLabels& labels,
+                     const Write& write) {
   Family& added =
       families_.try_emplace(family.name, Family{type, family.unit, family.help, {}}).first->second;
-  if (added.metrics.size() >= kMetrics ||
-      !added.metrics.try_emplace(std::move(labels), std::move(lines)).second) {
-    ++leftOut_;
-  }
+  if (added.metrics.size() >= kMetrics) return void(++leftOut_);
+  const auto [metric, isNew] = added.metrics.try_emplace(textOf(labels));
+  if (!isNew) return void(++leftOut_);
+  metric->second = write(metric->first);
 }
 
 void MetricPage::gauge(const MetricFamily& family, const MetricLabels& labels, double value) {
-  std::string text = textOf(labels);
-  std::string lines = line(family.name, text, numberOf(value));
-  add(family, "gauge", std::move(text), std::move(lines));
+  add(family, "gauge", labels,
+      [&](const std::string& text) { return line(family.name, text, numberOf(value)); });
 }
 
 void MetricPage::gauge(const MetricFamily& family, const MetricLabels& labels, std::int64_t value) {
-  std::string text = textOf(labels);
-  std::string lines = line(family.name, text, std::to_string(value));
-  add(family, "gauge", std::move(text), std::move(lines));
+  add(family, "gauge", labels,
+      [&](const std::string& text) { return line(family.name, text, std::to_string(value)); });
 }
 
 void MetricPage::summary(const MetricFamily& family, const MetricLabels& labels,
                          const SummaryPoint& point) {
-  std::string text = textOf(labels);
-  std::string lines;
-  for (const auto& [quantile, value] : point.quantiles) {
-    lines += line(family.name, text, numberOf(value), "quantile=\"" + boundOf(quantile) + "\"");
-  }
-  lines += line(family.name + "_sum", text, numberOf(point.sum));
-  lines += line(family.name + "_count", text, std::to_string(point.count));
-  add(family, "summary", std::move(text), std::move(lines));
+  add(family, "summary", labels, [&](const std::string& text) {
+    std::string lines;
+    for (const auto& [quantile, value] : point.quantiles) {
+      lines += line(family.name, text, numberOf(value), "quantile=\"" + boundOf(quantile) + "\"");
+    }
+    lines += line(family.name + "_sum", text, numberOf(point.sum));
+    lines += line(family.name + "_count", text, std::to_string(point.count));
+    return lines;
+  });
 }
 
 void MetricPage::histogram(const MetricFamily& family, const MetricLabels& labels,
                            const HistogramPoint& point) {
   if (point.buckets.empty()) return;
-  std::string text = textOf(labels);
-  std::string lines;
-  for (const auto& [bound, count] : point.buckets) {
-    lines +=
-        line(family.name + "_bucket", text, std::to_string(count), "le=\"" + boundOf(bound) + "\"");
-  }
-  lines += line(family.name + "_sum", text, numberOf(point.sum));
-  lines += line(family.name + "_count", text, std::to_string(point.buckets.back().second));
-  add(family, "histogram", std::move(text), std::move(lines));
+  add(family, "histogram", labels, [&](const std::string& text) {
+    std::string lines;
+    for (const auto& [bound, count] : point.buckets) {
+      lines += line(family.name + "_bucket", text, std::to_string(count),
+                    "le=\"" + boundOf(bound) + "\"");
+    }
+    lines += line(family.name + "_sum", text, numberOf(point.sum));
+    lines += line(family.name + "_count", text, std::to_string(point.buckets.back().second));
+    return lines;
+  });
 }
 
 std::string MetricPage::text() const {

@@ -74,8 +74,10 @@ class MetricPage {
     std::string_view type, unit, help;
     std::map<std::string, std::string> metrics;  // from labels to lines
   };
-  void add(const MetricFamily& family, std::string_view type, std::string&& labels,
-           std::string&& lines);
+  /// `write` makes the lines from the text of the labels. It is called only if there is room.
+  template <class Write>
+  void add(const MetricFamily& family, std::string_view type, const MetricLabels& labels,
+           const Write& write);
 
   std::map<std::string, Family> families_;
   std::uint64_t leftOut_ = 0;
