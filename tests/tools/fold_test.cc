@@ -42,6 +42,16 @@ TEST_F(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
   std::filesystem::create_directories(folder);
   device.check("stat fold", prints("0 segments: 0 scalars, 0 values; 0 removed\n"));
   recordElsewhere(device, {1.5, 2.5});
+  {
+    Openings opened(std::filesystem::directory_iterator(folder)->path());
+    for (const auto& [command, times] : {std::pair("export openmetrics", 3),
+                                         {"page -o -", 6},
+                                         {"completion days", 0},
+                                         {"stat list", 1}}) {
+      device.run(command);
+      EXPECT_EQ(opened.take(), times) << command;
+    }
+  }
   std::ofstream(folder / "x.segment") << "no segment";
   device.write(kWhitelistFile, xmlOf(R"({"G": {
       "ScalarKeys": {"app.n": {}}, "DistributionKeys": {"app.t": {"intervals": [2]}}}})"));

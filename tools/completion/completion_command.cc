@@ -52,9 +52,8 @@ void listKeys(ToolContext& context) {
 void listDays(ToolContext& context) {
   constexpr std::int64_t kShown = 31;
   context.out() << "today\nyesterday\n";
-  auto history =
-      openRecorded(context, {.key = "", .firstDay = 0, .lastDay = 0, .hasValues = false});
-  const auto held = history ? history->daysHeld() : history.error();
+  const auto history = context.storeForReading().openHistory();
+  const auto held = history ? (*history)->daysHeld() : history.error();
   if (!held || !*held) return;
   for (std::int64_t day = std::max<std::int64_t>((*held)->last - kShown + 1, (*held)->first);
        day <= (*held)->last; ++day) {

@@ -108,9 +108,10 @@ class DistributionExport {
   std::vector<double> values_;
 };
 
+// The last day in the store: what waits to be folded need not be read for it.
 std::optional<std::int32_t> latestDay(ToolContext& context) {
-  auto history = openRecorded(context, {.key = "", .hasValues = false});
-  const auto held = history ? history->daysHeld() : history.error();
+  const auto history = context.storeForReading().openHistory();
+  const auto held = history ? (*history)->daysHeld() : history.error();
   if (!held) {
     context.fail(held.error().message);
     return std::nullopt;

@@ -43,20 +43,20 @@ class Reader {
  public:
   explicit Reader(ToolContext& context, std::int32_t days) : context_(context), days_(days) {}
 
-  /// Reads the days up to `last`.
-  Status readDays(std::int32_t last) {
+  /// Reads the days up to `last`. Returns what they were read from.
+  Expected<RecordedHistory> readDays(std::int32_t last) {
     recorded_.first = lowInt32(std::max(std::int64_t{last} - days_ + 1, std::int64_t{kFirstDay}));
     recorded_.last = last;
     recorded_.day = last;
     auto history =
         openRecorded(context_, {.key = "", .firstDay = recorded_.first, .lastDay = last});
-    if (!history) return history.error();
-    const Status read = history->walkScalars(
+    if (!history) return history;
+    Status read = history->walkScalars(
         [&](std::string_view key, std::int32_t day, std::int64_t value, bool&) {
           entryOf(recorded_.scalars, key).days.emplace_back(day, value);
         });
-    if (!read) return read;
-    return history->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
+    if (!read) return read.error();
+    read = history->walkDistributions([&](std::string_view key, std::int32_t day, std::int64_t,
                                           BHHistoryDistributionEnumerator& enumerator, bool&) {
       Summary summary;
       double value = 0;
@@ -66,21 +66,22 @@ class Reader {
       if (!enumerator.failed())
         entryOf(recorded_.distributions, key).days.emplace_back(day, summary);
     });
+    if (!read) return read.error();
+    return history;
   }
 
   /// Reads up to yesterday or, when that finds nothing, up to the last day that has any.
   Status readLatest() {
     const std::int32_t today = context_.platform().statistics->BHDaysSince1970();
-    Status read = readDays(previousDay(today));
-    if (read && !latestDay(recorded_)) {
-      auto history = openRecorded(context_, {.key = "", .hasValues = false});
-      const auto held = history ? history->daysHeld() : history.error();
+    auto history = readDays(previousDay(today));
+    if (history && !latestDay(recorded_)) {
+      const auto held = history->daysHeld();
       if (!held) return held.error();
       // A day in the future stems from a clock that was wrong.
-      if (*held) read = readDays(std::min((*held)->last, today));
+      if (*held) history = readDays(std::min((*held)->last, today));
     }
     recorded_.day = latestDay(recorded_).value_or(recorded_.last);
-    return read;
+    return history ? Status(Done{}) : history.error();
   }
 
   /// Reads the values of the day that is shown.
@@ -131,7 +132,12 @@ class Reader {
 RecordedDays readRecordedDays(ToolContext& context, std::optional<std::int32_t> day,
                               std::int32_t days) {
   Reader reader(context, days);
-  Status read = day ? reader.readDays(*day) : reader.readLatest();
+  Status read = Done{};
+  if (!day) {
+    read = reader.readLatest();
+  } else if (const auto history = reader.readDays(*day); !history) {
+    read = history.error();
+  }
   if (const Status values = reader.readDay(); read && !values) read = values;
   return reader.take(read ? std::string() : read.error().message);
 }
