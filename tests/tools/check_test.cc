@@ -186,6 +186,7 @@ TEST_F(CheckTest, FindsDamageOfTheStoreAndWhatStandsBesideIt) {
     values += "scalar\t20000\tcom.example.key." + std::to_string(i) + "\t1\n";
   device.run("stat import -", values);
   expect("OK store: ", 0);
+  EXPECT_GT(device.json("status --check")["checks"][4]["figures"]["free_bytes"], 0);
   device.write(kStore + ".corrupt-1", "");
   device.write(kStore + "-kept", "");
   expect("WARNING store: ", 1);

@@ -168,6 +168,9 @@ TEST_F(LoadTest, TakesArchives) {
   write("in/d/e.metadata.plist", "<plist>");
   std::filesystem::create_symlink("a.log", at("in/d/link.log"));
   shell("tar -cf all.tar -C in d && tar -czf all.tgz -C in d && head -c 2000 all.tar > cut.tar");
+  const Outcome alone = run({at("in/d/e.log")});
+  EXPECT_EQ(alone.out, "0 loaded, 0 known, 1 refused\n");
+  EXPECT_NE(alone.error.find("e.log: its metadata: "), std::string::npos) << alone.error;
   const Outcome outcome = run({at("all.tar")});
   EXPECT_EQ(outcome.out, "2 loaded, 0 known, 2 refused; 1 without metadata\n");
   EXPECT_EQ(outcome.status, 1);
