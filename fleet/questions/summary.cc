@@ -22,6 +22,9 @@ CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogS
   return result;
 }
 
+/// Ends the reading of rows: what a visitor throws reaches its caller.
+struct EnoughRead {};
+
 }  // namespace
 
 bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key) {
@@ -32,19 +35,25 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
       const LogIndex log = table.find(row.log);
       if (log != kNoLog && among.contains(log)) logs.insert(log);
     }
+    if (logs.devices() >= ledger.devicesAtLeast()) throw EnoughRead();
   };
-  switch (key.kind) {
-    case KeyKind::Scalar:
-      engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
-      break;
-    case KeyKind::Distribution:
-      engine.distributions(key.name, [&](std::span<const DistributionValue> rows) { take(rows); });
-      break;
-    case KeyKind::Histogram:
-      engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
-      break;
+  try {
+    switch (key.kind) {
+      case KeyKind::Scalar:
+        engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
+        break;
+      case KeyKind::Distribution:
+        engine.distributions(key.name,
+                             [&](std::span<const DistributionValue> rows) { take(rows); });
+        break;
+      case KeyKind::Histogram:
+        engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
+        break;
+    }
+  } catch (const EnoughRead&) {
+    return true;
   }
-  return logs.devices() >= ledger.devicesAtLeast();
+  return false;
 }
 
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among) {

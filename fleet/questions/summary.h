@@ -37,10 +37,11 @@ struct SummaryAnswer {
   std::size_t histogramKeys = 0;
 };
 
-/// Whether enough devices have the statistic in these logs. Throws EngineError.
+/// Whether enough devices have the statistic in these logs. Reads no more rows than that takes.
+/// Throws EngineError.
 bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key);
 
-/// The statistics that enough devices have in these logs. Reads all rows. Throws EngineError.
+/// The statistics that enough devices have in these logs. Throws EngineError.
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among);
 
 /// What happens to logs of versions that have too few devices.

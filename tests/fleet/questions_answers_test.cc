@@ -344,6 +344,43 @@ TEST(PrivacyTest, APageLeavesSmallVersionsOut) {
   EXPECT_EQ(summary.scalarKeys, 1u);
 }
 
+// Hands out one row of each of 24 logs, one by one, and counts them.
+struct CountedRows : Engine {
+  Appended append(std::span<const LogRecord>) override { return {}; }
+  void logs(std::int32_t, std::int32_t, const Visitor<LogRow>&) override {}
+  std::vector<Key> keys() override { return {}; }
+  void scalars(std::string_view, const Visitor<ScalarValue>& visit) override { give(visit); }
+  void distributions(std::string_view, const Visitor<DistributionValue>& visit) override {
+    give(visit);
+  }
+  void cells(std::string_view, const Visitor<CellValue>& visit) override { give(visit); }
+  std::unique_ptr<Engine> reader() override { return nullptr; }
+  template <class Row>
+  void give(const Visitor<Row>& visit) {
+    Row row;
+    for (rows = 0; rows < 24;) {
+      row.log = ++rows;
+      visit({&row, 1});
+    }
+  }
+  LogId rows = 0;
+};
+
+TEST(SummaryTest, ReadsNoFurtherThanToEnoughDevices) {
+  TestFleet fleet;
+  for (int log = 0; log < 24; ++log)
+    fleet.add(log % 2, "1");
+  Ledger& ledger = fleet.ledger(5);
+  const LogSet all = logsOn(ledger.table(), {});
+  CountedRows engine;
+  for (const KeyKind kind : {KeyKind::Scalar, KeyKind::Distribution, KeyKind::Histogram}) {
+    EXPECT_TRUE(hasEnough(engine, ledger, all, {"k", kind}));
+    EXPECT_EQ(engine.rows, 9U) << "the fifth log of a day";
+    EXPECT_FALSE(hasEnough(engine, fleet.ledger(13), all, {"k", kind}));
+    EXPECT_EQ(engine.rows, 24U);
+  }
+}
+
 TEST(PrivacyTest, APageSaysWhichDaysItJoins) {
   TestFleet fleet;
   for (const auto& [day, devices] : {std::pair(1, 12), {2, 12}, {3, 11}, {4, 5}})
