@@ -7,6 +7,7 @@
 #include <exception>
 #include <functional>
 #include <limits>
+#include <mutex>
 #include <thread>
 
 #include "fleet/questions/exact_moments.h"
@@ -80,7 +81,6 @@ double independentValues(std::vector<std::size_t> logsByDay) {
   return logs * logs / squares;
 }
 
-/// What remains of a sample once its rows are read.
 struct Measured {
   ComparedSide side;
   double squaredError = 0;  // of the mean
@@ -88,11 +88,10 @@ struct Measured {
   double variance = 0;
 };
 
+/// What remains of a sample once its rows are read.
 struct SideResult {
-  const LogSet& logsWithMean() const { return withMean ? *withMean : logs; }
-
-  LogSet logs;
-  std::optional<LogSet> withMean;  // set when that is not all logs
+  std::shared_ptr<const LogSet> logs;
+  std::shared_ptr<const LogSet> withMean;  // the same set when all logs have a mean
   std::optional<Measured> measured;
 };
 using KeyResult = std::array<SideResult, 2>;
@@ -113,13 +112,6 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
   result.variance = squared / logs * (result.independent / (result.independent - 1));
   result.squaredError = result.variance / result.independent;
   side.deviation = std::sqrt(result.variance);
-  return result;
-}
-
-SideResult resultOf(const Sample& sample) {
-  SideResult result{sample.logs.set(), std::nullopt, std::nullopt};
-  if (sample.withoutMean) result.withMean = result.logs.without(sample.withoutMean->set());
-  result.measured = measure(sample, result.logs, result.logsWithMean());
   return result;
 }
 
@@ -202,8 +194,8 @@ class Comparer {
       const std::string subject = subjectOf(keys_[i].kind, keys_[i].name);
       const std::string means = subjectOfMeans(keys_[i].kind, keys_[i].name);
       const auto isAllowed = [&](const SideResult& side) {
-        return ledger.allows(subject, side.logs) &&
-               (side.logsWithMean().empty() || ledger.allows(means, side.logsWithMean()));
+        return ledger.allows(subject, *side.logs) &&
+               (side.withMean->empty() || ledger.allows(means, *side.withMean));
       };
       if (!isAllowed(before) || !isAllowed(after)) {
         ++answer.tooFew;
@@ -214,8 +206,8 @@ class Comparer {
         continue;
       }
       for (const SideResult& side : *results_[i]) {
-        ledger.noteShown(subject, side.logs);
-        ledger.noteShown(means, side.logsWithMean());
+        ledger.noteShown(subject, *side.logs);
+        ledger.noteShown(means, *side.withMean);
       }
       answer.comparisons.push_back(comparisonOf(keys_[i], *before.measured, *after.measured));
     }
@@ -223,7 +215,7 @@ class Comparer {
   }
 
  private:
-  std::unique_ptr<KeyResult> read(Engine& engine, const Key& key) const {
+  std::unique_ptr<KeyResult> read(Engine& engine, const Key& key) {
     const LogTable& table = ledger_.table();
     std::array<Sample, 2> samples = {Sample(table), Sample(table)};
     const auto add = [&](LogId id, const auto& value) {
@@ -248,10 +240,26 @@ class Comparer {
     return std::make_unique<KeyResult>(KeyResult{resultOf(before), resultOf(after)});
   }
 
+  SideResult resultOf(const Sample& sample) {
+    const LogSet logs = sample.logs.set();
+    SideResult result;
+    result.logs = result.withMean = keep(logs);
+    if (sample.withoutMean) result.withMean = keep(logs.without(sample.withoutMean->set()));
+    result.measured = measure(sample, *result.logs, *result.withMean);
+    return result;
+  }
+
+  std::shared_ptr<const LogSet> keep(const LogSet& logs) {
+    const std::lock_guard lock(mutex_);
+    return sets_.keep(logs);
+  }
+
   const Ledger& ledger_;
   const std::vector<Side> sides_;
   const std::vector<Key> keys_;
   std::vector<std::unique_ptr<KeyResult>> results_;
+  std::mutex mutex_;  // of `sets_`
+  SharedLogSets sets_;
   std::atomic<std::size_t> next_ = 0;
   std::atomic<bool> hasFailed_ = false;
   std::exception_ptr failure_;

@@ -55,14 +55,6 @@ bool Ledger::allows(const std::string& subject, const LogSet& logs) const {
   return isNoneOrEnough(rest);
 }
 
-std::shared_ptr<const LogSet> Ledger::keep(const LogSet& logs) {
-  const std::size_t hash = logs.hash();
-  const auto [first, last] = known_.equal_range(hash);
-  for (auto known = first; known != last; ++known)
-    if (*known->second == logs) return known->second;
-  return known_.emplace(hash, std::make_shared<const LogSet>(logs))->second;
-}
-
 std::shared_ptr<const LogSet> Ledger::noteShown(const std::string& subject, const LogSet& logs) {
   return noteDisjoint(subject, {&logs}).front();
 }
@@ -78,7 +70,7 @@ Ledger::Sets Ledger::noteDisjoint(const std::string& subject,
   const std::size_t earlier = sets.size();
   Sets result;
   for (const LogSet* logs : disjoint) {
-    const std::shared_ptr<const LogSet> kept = result.emplace_back(keep(*logs));
+    const std::shared_ptr<const LogSet> kept = result.emplace_back(sets_.keep(*logs));
     if (std::ranges::count(std::span(sets).first(earlier), kept) != 0) continue;
     std::shared_ptr<const LogSet> rest = kept;
     for (std::size_t i = 0; i < earlier; ++i)

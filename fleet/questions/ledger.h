@@ -47,8 +47,6 @@ class Ledger {
   std::vector<Sets> divisionsOf(const std::string& subject, const LogSet& whole) const;
 
  private:
-  /// The same set for equal logs: many subjects have them.
-  std::shared_ptr<const LogSet> keep(const LogSet& logs);
   /// Notes sets that share no log as shown.
   Sets noteDisjoint(const std::string& subject, const std::vector<const LogSet*>& disjoint);
   bool isNoneOrEnough(const LogSet& logs) const { return logs.empty() || hasEnough(logs); }
@@ -63,7 +61,7 @@ class Ledger {
     Sets parts;
   };
   std::map<std::string, std::vector<Parts>> divisions_;
-  std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;
+  SharedLogSets sets_;
 };
 
 /// The ledger's subjects of an answer about a statistic: one for the means, one for all other

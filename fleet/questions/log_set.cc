@@ -184,6 +184,14 @@ LogSet LogMarks::set() const {
   return result;
 }
 
+std::shared_ptr<const LogSet> SharedLogSets::keep(const LogSet& logs) {
+  const std::size_t hash = logs.hash();
+  const auto [first, last] = known_.equal_range(hash);
+  for (auto known = first; known != last; ++known)
+    if (*known->second == logs) return known->second;
+  return known_.emplace(hash, std::make_shared<const LogSet>(logs))->second;
+}
+
 LogSet logsOn(const LogTable& table, const DayRange& days) {
   LogSet logs;
   for (const LogTable::Day& day : table.days()) {

@@ -8,6 +8,8 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
+#include <map>
+#include <memory>
 #include <vector>
 
 #include "fleet/questions/log_table.h"
@@ -72,6 +74,15 @@ class LogMarks {
 
  private:
   std::vector<std::uint64_t> words_;
+};
+
+/// Keeps equal sets once: many statistics have the same logs.
+class SharedLogSets {
+ public:
+  std::shared_ptr<const LogSet> keep(const LogSet& logs);
+
+ private:
+  std::multimap<std::size_t, std::shared_ptr<const LogSet>> known_;  // by hash
 };
 
 /// The logs of these days.
