@@ -12,9 +12,16 @@ constexpr std::size_t kPieceBytes = 1U << 20;
 
 // How far the search and the readers may run ahead of the database: in pieces, and in bytes of
 // logs, whose records take about as much memory. It is enough to bridge the filing of a batch;
-// reusing memory costs less than taking more.
+// reusing memory costs less than taking more. The size of a log shows only when it is read, so the
+// search and each reader may exceed the bytes by one piece that ends with a log of
+// `limits::kLogBytes`: 65 MiB. Besides, each reader keeps the memory of the largest log that it has
+// expanded, at most 64 MiB.
 constexpr std::size_t kPiecesAhead = 80;
 constexpr std::size_t kBytesAhead = 192U << 20;
+
+// A log is read in about the time that it takes to file it, which one thread does, so more readers
+// would only wait, and take memory.
+constexpr unsigned kMostReaders = 4;
 
 }  // namespace
 
@@ -23,7 +30,7 @@ ReadingThreads::ReadingThreads(std::function<void(const SourceSink&)> find,
     : permitted_(permitted) {
   try {
     threads_.emplace_back([this, find = std::move(find)] { search(find); });
-    for (unsigned i = 0; i < threads; ++i)
+    for (unsigned i = 0; i < std::min(threads, kMostReaders); ++i)
       threads_.emplace_back([this] { readPieces(); });
   } catch (...) {
     stop();

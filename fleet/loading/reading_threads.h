@@ -22,7 +22,7 @@ namespace tavrel::fleet {
 class ReadingThreads {
  public:
   /// `find` runs in a thread of its own and passes what it finds to the sink. `next`
-  /// rethrows what `find` throws.
+  /// rethrows what `find` throws. No more than four threads read, however many are asked for.
   ReadingThreads(std::function<void(const SourceSink&)> find, const PermittedKeys& permitted,
                  unsigned threads);
   ReadingThreads(const ReadingThreads&) = delete;

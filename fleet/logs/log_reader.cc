@@ -52,11 +52,12 @@ std::string LogReader::readDocument(ByteSpan document, LogRecord& record) {
 }
 
 Expected<LogRecord> LogReader::read(ByteSpan bytes, const LogMetadata* metadata) {
+  documentBytes_ = bytes.size();
   if (isGzip(bytes)) {
     if (const Status done = gunzip(bytes, limits::kLogBytes, expanded_); !done) return done.error();
     bytes = asBytes(expanded_);
+    documentBytes_ = bytes.size();
   }
-  documentBytes_ = bytes.size();
   if (bytes.size() > limits::kLogBytes) {
     return Error{format("has more than %zu bytes", limits::kLogBytes)};
   }

@@ -21,7 +21,7 @@ class LogReader {
   /// The error is why the log is refused: one line, without the file's name. Without metadata,
   /// the versions are unknown.
   Expected<LogRecord> read(ByteSpan bytes, const LogMetadata* metadata);
-  /// The size of the last log, expanded.
+  /// The size of the last log, expanded unless that failed.
   std::size_t documentBytes() const { return documentBytes_; }
 
  private:

@@ -303,8 +303,13 @@ TEST_F(LoadTest, HandsOutLargeLogsOneByOne) {
   const auto find = [&](const char* folder) {
     return [this, folder](const SourceSink& sink) { visitSources(at(folder), {}, sink); };
   };
+  const auto threads = [] {
+    return std::distance(std::filesystem::directory_iterator("/proc/self/task"), {});
+  };
+  const auto before = threads();
   // Later logs may take all the memory before an earlier one is read.
   ReadingThreads crowd(find("many"), all, 8);
+  EXPECT_LE(threads(), before + 5);
   for (int i = 0; i < kMany; ++i)
     EXPECT_TRUE(crowd.next());
   EXPECT_FALSE(crowd.next());
