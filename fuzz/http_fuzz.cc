@@ -106,11 +106,8 @@ std::string rowsOf(fleet::Server& server, unsigned table, std::string answer) {
     switch (table % 5) {
       case 0:
         reading.logs(0, 1, [&](std::span<const fleet::LogRow> rows) {
-          for (const fleet::LogRow& row : rows) {
-            add(row.log, row.day, row.created, row.osVersion, row.previousOsVersion,
-                row.configNumber, row.whitelistDigest, row.taskID, row.language,
-                row.preferredLanguage, row.region);
-          }
+          for (const fleet::LogRow& row : rows)
+            add(row.log, row.day, row.osVersion, row.whitelistDigest, row.region);
         });
         break;
       case 1:

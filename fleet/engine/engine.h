@@ -28,18 +28,13 @@ class EngineError : public std::runtime_error {
 /// Identifies a log within one database; other databases number theirs differently.
 using LogId = std::uint64_t;
 
-/// Texts are valid only during the call that hands out the row.
+/// What questions need of a log; the tables have more. Texts are valid only during the call that
+/// hands out the row.
 struct LogRow {
   LogId log = 0;
   std::int32_t day = 0;
-  std::int64_t created = 0;
   std::string_view osVersion;
-  std::string_view previousOsVersion;
-  std::string_view configNumber;
   std::string_view whitelistDigest;
-  std::string_view taskID;
-  std::string_view language;
-  std::string_view preferredLanguage;
   std::string_view region;
 };
 

@@ -18,6 +18,11 @@ inline LogRecord makeRecord(std::uint64_t number, std::int32_t day = 20781) {
   record.day = day;
   record.created = 1'795'000'000 + static_cast<std::int64_t>(number);
   record.osVersion = "Pellio 4.2 (16R349)";
+  record.previousOsVersion = "before";
+  record.configNumber = "c";
+  record.taskID = "t";
+  record.language = "de";
+  record.preferredLanguage = "de-AT";
   record.region = record.texts.keep("region " + std::to_string(number));
   return record;
 }
@@ -41,20 +46,16 @@ inline std::string bitsOf(double value) {
   return std::to_string(std::bit_cast<std::uint64_t>(value));
 }
 
-/// Each row of a database as a line, sorted as text. A log is named after its creation time.
+/// Each row of a database as a line, sorted as text. A log is named after its region.
 inline std::vector<std::string> rowsIn(Engine& engine) {
   std::vector<std::string> lines;
   std::map<LogId, std::string> names;
   engine.logs(INT32_MIN, INT32_MAX, [&](std::span<const LogRow> rows) {
     for (const LogRow& row : rows) {
-      const std::string name = std::to_string(row.created);
+      const std::string name(row.region);
       names[row.log] = name;
-      std::string line = name + " " + std::to_string(row.day);
-      for (const std::string_view text :
-           {row.osVersion, row.previousOsVersion, row.configNumber, row.whitelistDigest, row.taskID,
-            row.language, row.preferredLanguage, row.region})
-        line += "|" + std::string(text);
-      lines.push_back(line);
+      lines.push_back(name + " " + std::to_string(row.day) + "|" + std::string(row.osVersion) +
+                      "|" + std::string(row.whitelistDigest));
     }
   });
   const auto add = [&](LogId log, const std::string& line) {

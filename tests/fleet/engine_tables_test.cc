@@ -11,6 +11,9 @@ namespace {
 // Statements that run on both engines, and their answers for 600 logs.
 const std::pair<std::string, std::string> kQuestions[] = {
     {"SELECT count(*), min(day), sum(created) FROM logs", "600\t20781\t1077000179700\n"},
+    {"SELECT os_version, previous_os_version, config_number, task_id, language, preferred_language "
+     "FROM logs WHERE region = 'region 7'",
+     "Pellio 4.2 (16R349)\tbefore\tc\tt\tde\tde-AT\n"},
     {"SELECT sum(value), count(*) FROM scalars WHERE key = 'a'", "539100\t600\n"},
     {"SELECT sum(minimum + maximum + mean + squared_deviations) FROM distributions WHERE key = 'a'",
      "1425\n"},

@@ -78,14 +78,11 @@ void ClickhouseReading::logs(std::int32_t firstDay, std::int32_t lastDay,
                              const Visitor<LogRow>& visit) {
   const std::string days =
       "day BETWEEN " + std::to_string(firstDay) + " AND " + std::to_string(lastDay);
-  readRows<LogRow>(
-      server_, bytes_,
-      "SELECT log, day, created, os_version, previous_os_version, config_number, "
-      "whitelist_digest, task_id, language, preferred_language, region FROM log WHERE " +
-          days + " AND log GLOBAL IN (SELECT min(log) FROM log GROUP BY digest)",
-      visit, &LogRow::log, &LogRow::day, &LogRow::created, &LogRow::osVersion,
-      &LogRow::previousOsVersion, &LogRow::configNumber, &LogRow::whitelistDigest, &LogRow::taskID,
-      &LogRow::language, &LogRow::preferredLanguage, &LogRow::region);
+  readRows<LogRow>(server_, bytes_,
+                   "SELECT log, day, os_version, whitelist_digest, region FROM log WHERE " + days +
+                       " AND log GLOBAL IN (SELECT min(log) FROM log GROUP BY digest)",
+                   visit, &LogRow::log, &LogRow::day, &LogRow::osVersion, &LogRow::whitelistDigest,
+                   &LogRow::region);
 }
 
 std::vector<Key> ClickhouseReading::keys() {

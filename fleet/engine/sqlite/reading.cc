@@ -76,8 +76,7 @@ const Connection& withFunction(const Connection& connection, Reading::Taking& ta
 }
 
 constexpr const char* kLogs =
-    "SELECT id, day, created, os_version, previous_os_version, config_number, whitelist_digest, "
-    "task_id, language, preferred_language, region FROM log WHERE day BETWEEN ?1 AND ?2";
+    "SELECT id, day, os_version, whitelist_digest, region FROM log WHERE day BETWEEN ?1 AND ?2";
 
 }  // namespace
 
@@ -101,15 +100,9 @@ void Reading::logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<Lo
     LogRow row;
     row.log = static_cast<LogId>(statement.integer(0));
     row.day = static_cast<std::int32_t>(statement.integer(1));
-    row.created = statement.integer(2);
-    row.osVersion = statement.text(3);
-    row.previousOsVersion = statement.text(4);
-    row.configNumber = statement.text(5);
-    row.whitelistDigest = statement.text(6);
-    row.taskID = statement.text(7);
-    row.language = statement.text(8);
-    row.preferredLanguage = statement.text(9);
-    row.region = statement.text(10);
+    row.osVersion = statement.text(2);
+    row.whitelistDigest = statement.text(3);
+    row.region = statement.text(4);
     visit({&row, 1});
   }
 }
