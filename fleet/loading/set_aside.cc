@@ -30,12 +30,13 @@ std::string safeName(std::string_view name) {
 }  // namespace
 
 Status SetAside::keep(const SourceItem& refused) {
-  std::string bytes = refused.content;
-  if (bytes.empty() && !refused.path.empty()) {
+  std::string fromFile;
+  if (refused.content.empty() && !refused.path.empty()) {
     if (auto read = readSourceFile(refused.path, limits::kLogBytes, refused.mayBeLink)) {
-      bytes = *std::move(read);
+      fromFile = *std::move(read);
     }
   }
+  const std::string& bytes = refused.content.empty() ? fromFile : refused.content;
   constexpr std::size_t kDigits = 16;
   std::string digest;
   // Logs that cannot be read have no bytes; their place tells them apart.
@@ -43,11 +44,17 @@ Status SetAside::keep(const SourceItem& refused) {
   const std::string path =
       folder_ + '/' + digest.substr(0, kDigits) + '-' + safeName(fileNameOf(refused.name));
   if (!bytes.empty()) {
-    if (Status done = files_.replace(path, asBytes(bytes), kMode); !done) return done;
+    if (Status done = write(path, asBytes(bytes)); !done) return done;
   }
   // Printable, since people may show the file on a terminal.
   const std::string reason = printable(refused.name + ": " + refused.reason) + '\n';
-  return files_.replace(path + ".reason", asBytes(reason), kMode);
+  return write(path + ".reason", asBytes(reason));
+}
+
+Status SetAside::write(const std::string& path, ByteSpan bytes) {
+  const auto present = files_.readIfPresent(path, bytes.size());
+  if (present && *present == asText(bytes)) return Done{};
+  return files_.replace(path, bytes, kMode);
 }
 
 }  // namespace tavrel::fleet

@@ -3,6 +3,7 @@
 
 #include <string>
 
+#include "base/bytes.h"
 #include "base/expected.h"
 #include "fleet/sources/source_item.h"
 #include "platform/linux/files/file_system.h"
@@ -20,6 +21,9 @@ class SetAside {
   Status keep(const SourceItem& refused);
 
  private:
+  /// Leaves a file alone that already has these bytes: each load refuses the same logs again.
+  Status write(const std::string& path, ByteSpan bytes);
+
   std::string folder_;
   FileSystem files_;
 };

@@ -10,6 +10,7 @@
 #include "fleet/loading/reading_threads.h"
 #include "fleet/sources/sources.h"
 #include "platform/linux/files/digests.h"
+#include "platform/linux/files/file_system.h"
 #include "tests/fleet/loading/sample_log.h"
 #include "tests/platform/temporary_root.h"
 
@@ -220,6 +221,7 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
   std::filesystem::create_directory_symlink(at("in"), at("in/sub/loop"));
   ASSERT_EQ(mkfifo(at("in/pipe.log").c_str(), 0600), 0);
   std::filesystem::create_directory(at("in/z"));
+  std::map<std::string, ino_t> written;
   for (int time = 0; time < 2; ++time) {
     const Outcome outcome = run({at("in"), "--set-aside", at("in/z/aside")});
     EXPECT_EQ(outcome.error,
@@ -229,6 +231,10 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
               "tavrel-fleet: skipped: in/pipe.log: is not a regular file\n"
               "tavrel-fleet: refused: in/sub/empty.log: is empty\n");
     EXPECT_EQ(outcome.status, 1);
+    for (const auto& file : std::filesystem::directory_iterator(at("in/z/aside"))) {
+      const ino_t inode = FileSystem::status(file.path())->st_ino;
+      EXPECT_EQ(written.try_emplace(file.path(), inode).first->second, inode) << file.path();
+    }
   }
   std::map<std::string, std::string> kept;
   for (const auto& file : std::filesystem::directory_iterator(at("in/z/aside")))
