@@ -118,12 +118,21 @@ class Visit {
  private:
   /// A device's logs are in a folder of its name. The path may leave that out, as "./a.log" does,
   /// or lead there through a link.
-  const LogMetadata* lineOf(const std::string& path, std::string_view log) const {
+  const LogMetadata* lineOf(const std::string& path, std::string_view log) {
     const LogMetadata* const line = lines_.find(folderNameOf(path), log);
     if (line != nullptr || lines_.empty()) return line;
-    std::error_code unknown;
-    const auto folder = std::filesystem::absolute(path, unknown).parent_path();
-    return lines_.find(std::filesystem::canonical(folder, unknown).filename().native(), log);
+    return lines_.find(realFolderNameOf(path), log);
+  }
+
+  const std::string& realFolderNameOf(const std::string& path) {
+    const auto folder = std::filesystem::path(path).parent_path();
+    if (folder != resolved_) {
+      std::error_code unknown;
+      const auto absolute = std::filesystem::absolute(path, unknown).parent_path();
+      realName_ = std::filesystem::canonical(absolute, unknown).filename().native();
+      resolved_ = folder;
+    }
+    return realName_;
   }
 
   bool mayLineFollow(const std::string& path) const {
@@ -159,6 +168,8 @@ class Visit {
   const UploadLines& lines_;
   const SourceSink& sink_;
   const std::optional<std::string>& leftOut_;
+  std::optional<std::filesystem::path> resolved_;  // the folder whose name `realName_` is
+  std::string realName_;
 };
 
 }  // namespace
