@@ -62,7 +62,12 @@ struct Key {
   KeyKind kind = KeyKind::Scalar;
 };
 
-/// Rows come in blocks, in no particular order, each once. A visitor's exceptions reach the caller.
+/// What a visitor throws when it needs no more rows. It ends the operation and does not reach the
+/// caller.
+struct EnoughRows {};
+
+/// Rows come in blocks, in no particular order, each once. A visitor's other exceptions reach the
+/// caller.
 template <class Row>
 using Visitor = std::function<void(std::span<const Row>)>;
 

@@ -22,9 +22,6 @@ CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogS
   return result;
 }
 
-/// Ends the reading of rows: what a visitor throws reaches its caller.
-struct EnoughRead {};
-
 }  // namespace
 
 bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key) {
@@ -35,25 +32,20 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
       const LogIndex log = table.find(row.log);
       if (log != kNoLog && among.contains(log)) logs.insert(log);
     }
-    if (logs.devices() >= ledger.devicesAtLeast()) throw EnoughRead();
+    if (logs.devices() >= ledger.devicesAtLeast()) throw EnoughRows();
   };
-  try {
-    switch (key.kind) {
-      case KeyKind::Scalar:
-        engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
-        break;
-      case KeyKind::Distribution:
-        engine.distributions(key.name,
-                             [&](std::span<const DistributionValue> rows) { take(rows); });
-        break;
-      case KeyKind::Histogram:
-        engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
-        break;
-    }
-  } catch (const EnoughRead&) {
-    return true;
+  switch (key.kind) {
+    case KeyKind::Scalar:
+      engine.scalars(key.name, [&](std::span<const ScalarValue> rows) { take(rows); });
+      break;
+    case KeyKind::Distribution:
+      engine.distributions(key.name, [&](std::span<const DistributionValue> rows) { take(rows); });
+      break;
+    case KeyKind::Histogram:
+      engine.cells(key.name, [&](std::span<const CellValue> rows) { take(rows); });
+      break;
   }
-  return false;
+  return logs.devices() >= ledger.devicesAtLeast();
 }
 
 std::vector<Key> shownKeys(Engine& engine, const Ledger& ledger, const LogSet& among) {

@@ -114,12 +114,22 @@ TEST_P(EngineContract, TakesManyLogsAtOnce) {
 
 TEST_P(EngineContract, PassesOnWhatAVisitorThrows) {
   const auto engine = open();
-  engine->append(fullRecords(300));
+  engine->append(fullRecords(1500));
   const auto fail = [](auto) { throw std::runtime_error("enough"); };
   EXPECT_THROW(engine->scalars("a", fail), std::runtime_error);
   EXPECT_THROW(engine->cells("a", fail), std::runtime_error);
-  EXPECT_EQ(engine->append(fullRecords(1, 300)).added, 1u);
-  EXPECT_EQ(rowsIn(*engine).size(), 2107u);
+  int calls = 0;
+  const auto end = [&](auto) {
+    ++calls;
+    throw EnoughRows();
+  };
+  engine->logs(0, INT32_MAX, end);
+  engine->scalars("a", end);
+  engine->distributions("a", end);
+  engine->cells("a", end);
+  EXPECT_EQ(calls, 4) << "none was called again";
+  EXPECT_EQ(engine->append(fullRecords(1, 1500)).added, 1u);
+  EXPECT_EQ(rowsIn(*engine).size(), 10507u);
 }
 
 TEST_P(EngineContract, LetsTwoLoadersAppendTheSameLogs) {

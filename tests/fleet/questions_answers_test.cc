@@ -358,9 +358,14 @@ struct CountedRows : Engine {
   template <class Row>
   void give(const Visitor<Row>& visit) {
     Row row;
-    for (rows = 0; rows < 24;) {
-      row.log = ++rows;
-      visit({&row, 1});
+    rows = 0;
+    try {
+      while (rows < 24) {
+        row.log = ++rows;
+        visit({&row, 1});
+      }
+    } catch (const EnoughRows&) {
+      return;
     }
   }
   LogId rows = 0;

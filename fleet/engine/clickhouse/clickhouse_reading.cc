@@ -36,6 +36,7 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
       columnTypeOf<std::remove_reference_t<std::invoke_result_t<Fields, Row&>>>()...};
   bytes.clear();
   std::size_t enough = 1;  // how many bytes make another search worthwhile
+  bool isDone = false;     // the visitor needs no more rows
   NativeBlock block;
   const auto takeBlocks = [&] {
     std::size_t taken = 0;
@@ -47,7 +48,12 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
                           "made the tables, and try again");
       }
       if (found == NativeBlock::Found::Part) break;
-      visitBlock<Row>(block, visit, fields...);
+      try {
+        visitBlock<Row>(block, visit, fields...);
+      } catch (const EnoughRows&) {
+        isDone = true;
+        return bytes.clear();
+      }
       taken += block.size();
     }
     bytes.erase(0, taken);
@@ -60,6 +66,8 @@ void readRows(Server& server, std::string& bytes, const std::string& statement,
     enough = 2 * bytes.size() + 1;
   };
   server.ask(statement + " FORMAT Native", [&](std::string_view piece) {
+    // A server whose answer is not received to its end logs that as a failure of its own.
+    if (isDone) return;
     bytes += piece;
     if (bytes.size() >= enough) takeBlocks();
   });

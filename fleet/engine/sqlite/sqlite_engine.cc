@@ -10,6 +10,15 @@
 namespace tavrel::fleet {
 namespace {
 
+template <class Read>
+void untilEnough(const Read& read) {
+  try {
+    read();
+  } catch (const EnoughRows&) {
+    // The visitor has ended the reading.
+  }
+}
+
 class SqliteEngine final : public Engine {
  public:
   SqliteEngine(const std::string& path, bool writes)
@@ -26,17 +35,17 @@ class SqliteEngine final : public Engine {
   }
 
   void logs(std::int32_t firstDay, std::int32_t lastDay, const Visitor<LogRow>& visit) override {
-    reading_.logs(firstDay, lastDay, visit);
+    untilEnough([&] { reading_.logs(firstDay, lastDay, visit); });
   }
   std::vector<Key> keys() override { return reading_.keys(); }
   void scalars(std::string_view key, const Visitor<ScalarValue>& visit) override {
-    reading_.scalars(key, visit);
+    untilEnough([&] { reading_.scalars(key, visit); });
   }
   void distributions(std::string_view key, const Visitor<DistributionValue>& visit) override {
-    reading_.distributions(key, visit);
+    untilEnough([&] { reading_.distributions(key, visit); });
   }
   void cells(std::string_view key, const Visitor<CellValue>& visit) override {
-    reading_.cells(key, visit);
+    untilEnough([&] { reading_.cells(key, visit); });
   }
 
   std::unique_ptr<Engine> reader() override {
