@@ -361,6 +361,7 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
       {{"compare", "OS 9", "4.10"}, 1, "version \"OS 9\"" + few + " lists the versions"},
       {"compare OS 4.10", 1,
        "version \"OS\" is part of several versions: write one of them in full"},
+      {"compare 4.1 4.9", 1, "version \"4.1\"" + few + " lists the versions"},
       {"compare 4.9 4.9", 2, "OLD and NEW are the same version: name two"},
       {"summary --days 0", 2,
        "--days: \"0\" is not a range of days: write FIRST..LAST with days as YYYY-MM-DD, "
