@@ -464,16 +464,19 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
   std::string elsewhere = TAVREL_BUILD "/not-in-memory-XXXXXX";
   ASSERT_NE(mkdtemp(elsewhere.data()), nullptr);
   std::filesystem::create_directories(elsewhere + "/run/tavrel/stat");
-  const std::tuple<const char*, BHClientStatus, const char*> cases[] = {
+  const std::string longest = std::string(4000 - 17 - root.native().size(), '/') + root.native();
+  const std::tuple<std::string, BHClientStatus, const char*> cases[] = {
       {"/dev/shm/tavrel-absent/", BHClientStatusNoFolder,
        "the device has no folder /run/tavrel/stat: nothing is recorded"},
-      {elsewhere.c_str(), BHClientStatusNotInMemory,
+      {elsewhere, BHClientStatusNotInMemory,
        "/run/tavrel/stat is not on a tmpfs: nothing is recorded"},
-      {root.c_str(), BHClientStatusRecording, "values are recorded"},
+      {"/" + longest, BHClientStatusUnsupported,
+       "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long: nothing is recorded"},
+      {longest, BHClientStatusRecording, "values are recorded"},
   };
   for (const auto& [device, status, text] : cases) {
     run([&, &device = device, &status = status, &text = text] {
-      setenv("TAVREL_ROOT", device, 1);
+      setenv("TAVREL_ROOT", device.c_str(), 1);
       EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusNoKey);
       keys();
       errno = 77;
