@@ -196,16 +196,21 @@ TEST_F(Recording, ValuesOfAnImpossibleClockAreDatedOnceItIsSet) {
 }
 
 TEST_F(Recording, WithoutFreshCellsEachScalarKeepsOne) {
-  const pid_t child = untilItStops(start([] {
-    testClock().realtime = 1000;
+  const pid_t child = untilItStops(start([this] {
+    testClock().realtime = testClock().coarse = 1000;
     for (int second = 1; second <= kBHCellCount - kBHKeys + 3; ++second) {
       testClock().boot = second;
       add(1);
     }
+    std::filesystem::remove(folder / "fold-wanted");
+    testClock().coarse = 2000;
+    int cells = kBHCellCount - kBHKeys;
     for (int day = 0; day <= kBHKeys; ++day) {
       testClock().realtime = (kToday + day) * 86'400;
       if (day == 0) set(7);
       add(1);
+      cells += day == 0 ? 2 : 1;
+      EXPECT_EQ(std::filesystem::exists(folder / "fold-wanted"), cells > kBHCellCount * 3 / 4);
     }
     set(8);
     kill(getpid(), SIGSTOP);
@@ -492,6 +497,14 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
       EXPECT_EQ(errno, 77);
     });
   }
+  run([&] {  // a relative folder, in one that is gone
+    std::filesystem::create_directory(root / "gone");
+    std::filesystem::current_path(root / "gone");
+    std::filesystem::remove(root / "gone");
+    setenv("TAVREL_ROOT", "device", 1);
+    add(1);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusUnsupported);
+  });
   EXPECT_TRUE(std::filesystem::is_empty(elsewhere + "/run/tavrel/stat"));
   EXPECT_EQ(segments().size(), 1U);
   std::filesystem::remove_all(elsewhere);
