@@ -52,6 +52,7 @@ TEST_F(StatFoldTest, ShowsWhatWaitsAndFoldsIt) {
       EXPECT_EQ(opened.take(), times) << command;
     }
   }
+  expectIn(device.run("page -o -").out, {"Device on " + dayDateText(today()), "app.<wbr>n"});
   std::ofstream(folder / "x.segment") << "no segment";
   device.write(kWhitelistFile, xmlOf(R"({"G": {
       "ScalarKeys": {"app.n": {}}, "DistributionKeys": {"app.t": {"intervals": [2]}}}})"));

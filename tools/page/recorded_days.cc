@@ -74,11 +74,13 @@ class Reader {
   Status readLatest() {
     const std::int32_t today = context_.platform().statistics->BHDaysSince1970();
     auto history = readDays(previousDay(today));
+    // The store does not know of days whose values wait; today's do.
+    if (history && !latestDay(recorded_)) history = readDays(today);
     if (history && !latestDay(recorded_)) {
       const auto held = history->daysHeld();
       if (!held) return held.error();
       // A day in the future stems from a clock that was wrong.
-      if (*held) history = readDays(std::min((*held)->last, today));
+      history = readDays(*held ? std::min((*held)->last, today) : previousDay(today));
     }
     recorded_.day = latestDay(recorded_).value_or(recorded_.last);
     return history ? Status(Done{}) : history.error();

@@ -32,8 +32,8 @@ class RecordedHistory {
   /// False when the store lacks rows of days after `dayBefore`; the system log has the reason.
   bool isStoreComplete(std::int64_t dayBefore) { return stored_ && stored_->isComplete(dayBefore); }
 
-  /// The first and the last day with a row, which may be any row of the store, but of those that
-  /// wait only a selected one. Nothing when there is none.
+  /// The first and the last day with a row: any row of the store, or a selected one that waits.
+  /// Nothing when there is no such row.
   Expected<std::optional<SqliteHistory::DaySpan>> daysHeld();
 
   /// Why the store is not read; nothing when it is.
