@@ -469,7 +469,8 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
   std::string elsewhere = TAVREL_BUILD "/not-in-memory-XXXXXX";
   ASSERT_NE(mkdtemp(elsewhere.data()), nullptr);
   std::filesystem::create_directories(elsewhere + "/run/tavrel/stat");
-  const std::string longest = std::string(4000 - 17 - root.native().size(), '/') + root.native();
+  const std::string longest =
+      std::string(4000 - sizeof "/run/tavrel/stat" - root.native().size(), '/') + root.native();
   const std::tuple<std::string, BHClientStatus, const char*> cases[] = {
       {"/dev/shm/tavrel-absent/", BHClientStatusNoFolder,
        "the device has no folder /run/tavrel/stat: nothing is recorded"},
