@@ -7,9 +7,9 @@
 // numbers of attributes with their contents, each followed by 0xFF, and finally the drives' answer.
 #include <algorithm>
 #include <dlfcn.h>
-#include <map>
 #include <optional>
 #include <regex.h>
+#include <unordered_map>
 #include <vector>
 
 #include "memory_tree.h"
@@ -143,10 +143,11 @@ void useMachine(fuzz::Input& input, unsigned choice) {
 }  // namespace
 
 // For each drive that it opens, libatasmart compiles the names of drives with quirks again, which
-// would take longer than everything else. This keeps the compiled patterns.
+// would take longer than everything else. This keeps the compiled patterns. They are literals, so
+// their addresses find them.
 extern "C" int regcomp(regex_t* made, const char* pattern, int flags) {
-  static auto& known = *new std::map<std::pair<std::string, int>, regex_t>;
-  const auto [at, isNew] = known.try_emplace({pattern, flags});
+  static auto& known = *new std::unordered_map<const char*, regex_t>;
+  const auto [at, isNew] = known.try_emplace(pattern);
   if (isNew) {
     const auto compile = reinterpret_cast<decltype(&regcomp)>(dlsym(RTLD_NEXT, "regcomp"));
     require(compile(&at->second, pattern, flags) == 0);
