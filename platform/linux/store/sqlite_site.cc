@@ -9,6 +9,7 @@
 #include "base/civil_time.h"
 #include "base/format.h"
 #include "base/system_text.h"
+#include "platform/linux/files/file_opening.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/stamp.h"
 #include "platform/linux/store/damage_check.h"
@@ -16,10 +17,6 @@
 
 namespace tavrel {
 namespace {
-
-std::string folderOf(const std::string& path) {
-  return path.substr(0, path.rfind('/'));
-}
 
 constexpr std::string_view kSetAsideMark = ".corrupt-";
 // 2020-01-01: a clock that shows an earlier day was not set.
