@@ -396,6 +396,7 @@ TEST(PrivacyTest, APageSaysWhichDaysItJoins) {
   EXPECT_EQ(page.find("1970-01-03"), std::string::npos) << "the chart ends before the last day";
   EXPECT_THAT(page, testing::HasSubstr("Without 2 days, so that nothing reveals groups of fewer "
                                        "than 10 devices."));
+  EXPECT_THAT(page, testing::HasSubstr("data for 2 of 3 days"));
 }
 
 TEST(PrivacyTest, NothingSmallFollowsFromTheAnswersOfARun) {
