@@ -8,6 +8,7 @@
 #include <time.h>
 #include <utility>
 
+#include "base/arithmetic.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
@@ -214,9 +215,9 @@ bool SqliteTrim::removeRow(std::int32_t day, Row& row, std::int64_t& budget) {
 
 bool SqliteTrim::canBeConverted(std::int64_t bytes) {
   struct statvfs room {};
-  return bytes <= kConvertibleBytes && statvfs(site_.path.c_str(), &room) == 0 &&
-         static_cast<std::int64_t>(room.f_bavail) * static_cast<std::int64_t>(room.f_frsize) >=
-             kConversionRoom * bytes;
+  if (bytes > kConvertibleBytes || statvfs(site_.path.c_str(), &room) != 0) return false;
+  const auto available = checkedMultiply(room.f_bavail, room.f_frsize);
+  return !available || *available >= static_cast<std::uint64_t>(kConversionRoom * bytes);
 }
 
 Status SqliteTrim::giveBack(std::int64_t freeBytesKept) {
