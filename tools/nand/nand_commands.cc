@@ -266,7 +266,7 @@ void addNandCommands(Command app, ToolContext& context) {
       .required();
   countersCommand
       .addOption("--manufacturer-id", arguments->manufacturerId,
-                 "The controller's, in hexadecimal digits")
+                 "The controller's: 12 hexadecimal digits")
       .typeName("ID")
       .required();
   context.addJsonOption(countersCommand);
