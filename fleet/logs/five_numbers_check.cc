@@ -26,7 +26,9 @@ const char* faultOf(const FiveNumbers& n) {
     return "only one of its minimum and maximum is not a number";
   }
   if (n.minimum > n.maximum) return "its minimum is above its maximum";
-  if (n.squaredDeviations < 0) return "its deviations are negative";
+  // Minus infinity follows from a difference beyond the range of a double, as does the mean then.
+  const bool isOverflow = std::isinf(n.squaredDeviations) && std::isinf(n.mean);
+  if (n.squaredDeviations < 0 && !isOverflow) return "its deviations are negative";
   if (n.count == 1) {
     const bool isOneValue =
         same(n.minimum, n.maximum) && same(n.minimum, n.mean) && n.squaredDeviations == 0;
@@ -43,7 +45,9 @@ const char* faultOf(const FiveNumbers& n) {
     // They are largest when each value is the minimum or the maximum; rounding may add to that.
     const double most = static_cast<double>(n.count) * (n.maximum - n.mean) * (n.mean - n.minimum);
     const double size = std::max(std::abs(n.minimum), std::abs(n.maximum));
-    const double margin = 1e-6 * (most + static_cast<double>(n.count) * size * size);
+    const double margin = static_cast<double>(n.count) *
+                              (1e-6 * size * size + std::numeric_limits<double>::denorm_min()) +
+                          1e-6 * most;
     return n.squaredDeviations > most + margin ? "its deviations are larger than its range allows"
                                                : nullptr;
   }

@@ -15,8 +15,8 @@ std::optional<Interval> parseIntervalLabel(std::string_view label) {
   const auto lower = plist::parseReal(ends.substr(0, comma));
   const auto upper = plist::parseReal(ends.substr(comma + 2));
   if (!lower || !upper || !(*lower < *upper)) return std::nullopt;
-  // Only the last bucket is open above.
-  if (close != (std::isinf(*upper) ? ')' : ']')) return std::nullopt;
+  // Only the last bucket is open above. It ends in "inf]" when the whitelist has that boundary.
+  if (close != ']' && (close != ')' || !std::isinf(*upper))) return std::nullopt;
   return Interval{*lower, *upper};
 }
 

@@ -18,8 +18,9 @@ namespace tavrel::fleet {
 /// classes within which no cells overlap. Within a class, neighbouring cells of too few devices
 /// are joined. Of classes that have too few devices as a whole, only the number of values is
 /// kept, as one cell over all numbers; when that too has too few devices, the cell with the
-/// fewest values joins it. So each resulting cell is of enough devices, and so is everything that
-/// can be computed from the cells.
+/// fewest values joins it. So each resulting cell is of enough devices, and so is every number of
+/// values that can be computed from the cells. The ends of a joined cell are those of the outermost
+/// cells in it, which may be of few devices.
 class CellClasses {
  public:
   explicit CellClasses(const LogTable& table) : table_(table) {}

@@ -22,7 +22,8 @@ TEST_F(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
         "options": {"sigfig": 2, "intervals": [1], "sig_fig": -1, "bucket_interval": 0},
         "types": {"sig_fig": "2", "bucket_interval": 2.5}}},
     "B": {"DistributionKeys": {"d": {"sig_fig": 1, "intervals": 3},
-                               "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5]}},
+                               "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5,
+                                                   {"$real": "inf"}]}},
       "ScalarKeyPrefixes": {"p.": {}, "p.q.": {"sig_fig": 1}, "p.q.r": {"sig_fig": 1},
                             "p.s": {"sig_fig": 1}, "": {}},
       "DistributionKeyPrefixes": {"e.": {}},
@@ -43,10 +44,11 @@ A/Scalars: is not a table of a group: ignored; the tables are ScalarKeys, Scalar
 B/DistributionKeyPrefixes/e.: lets out the exact minimum and maximum of every distribution with this prefix: list keys one by one
 B/DistributionKeys/d/intervals: is an integer: expected an array of numbers: no histogram is made
 B/DistributionKeys/d/sig_fig: does not affect distributions: ignored
-B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty
-B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket stays empty
-B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty
-B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty
+B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its bucket stays empty, and tavrel-fleet may refuse the logs
+B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket stays empty, and tavrel-fleet may refuse the logs
+B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty, and tavrel-fleet may refuse the logs
+B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty, and tavrel-fleet may refuse the logs
+B/DistributionKeys/e/intervals/6: is infinite: leave it out, the outer buckets are open already
 B/ScalarKeyPrefixes/: is the empty prefix: every key begins with it
 B/ScalarKeyPrefixes/: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
 B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended

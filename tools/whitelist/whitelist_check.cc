@@ -190,11 +190,18 @@ class Checker {
       const Place place(*this, name);
       const auto number = boundary.number();
       if (!number) {
-        add(format("is %s: expected a number: its bucket stays empty", kindWithArticle(boundary)));
+        add(
+            format("is %s: expected a number: its bucket stays empty, and tavrel-fleet may refuse "
+                   "the logs",
+                   kindWithArticle(boundary)));
       } else if (std::isnan(number->real())) {
-        add("is not a number: its bucket stays empty");
+        add("is not a number: its bucket stays empty, and tavrel-fleet may refuse the logs");
+      } else if (std::isinf(number->real())) {
+        add("is infinite: leave it out, the outer buckets are open already");
       } else if (index > 0 && number->real() <= largest) {
-        add(format("is %s, not above the boundaries before it: its bucket stays empty",
+        add(
+            format("is %s, not above the boundaries before it: its bucket stays empty, and "
+                   "tavrel-fleet may refuse the logs",
                    inlineText(boundary)));
       } else {
         largest = number->real();

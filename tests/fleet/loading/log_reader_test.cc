@@ -126,6 +126,13 @@ TEST(LogReaderTest, TellsLogsApartByAllThatTheySay) {
   }
 }
 
+TEST(LogReaderTest, TakesWhatADeviceMakesOfExtremes) {
+  const std::string log = changed(changed(kSampleLog, ">1</real>", ">-1e308</real>"),  //
+                                  ">250</real>", ">1e308</real>");
+  EXPECT_EQ(faultIn(changed(changed(log, "67.875", "-inf"), "44257.1875", "-inf")), "none");
+  EXPECT_EQ(faultIn(changed(kSampleLog, "(100, inf)", "(100, inf]")), "none");
+}
+
 TEST(LogReaderTest, NamesWhatIsWrong) {
   const char* const four = "<integer>4</integer>";
   const std::string delay = "BHDistributions/app.delay: ";
