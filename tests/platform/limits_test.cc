@@ -277,8 +277,16 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   write(records + "176-2026-11-25.jsonl", "r");
   write("/var/lib/tavrel/ecc-events/b.event", std::string(60'000, 'e'));
   write("/var/lib/tavrel/ecc-events/a.event", std::string(60'000, 'e'));
-  write("/var/mobile/Library/Brimhold/BHDataStore.sqlitedb-kept-damaged", std::string(70'000, 'c'));
-  write("/var/lib/tavrel/ecc-events/c.event.unusable", std::string(70'000, 'u'));
+  const std::string sqlite = "/var/mobile/Library/Brimhold/BHDataStore.sqlitedb";
+  const auto setAside = [&](const std::string& name, int daysAgo) {
+    write(name, std::string(70'000, 'c'));
+    const timespec changed{(kToday - daysAgo) * kSecondsPerDay, 0};
+    const timespec times[] = {changed, changed};
+    utimensat(AT_FDCWD, root.path(name).c_str(), times, 0);
+  };
+  setAside(sqlite + "-kept-damaged", 2);
+  setAside("/var/lib/tavrel/ecc-events/c.event.unusable", -2);
+  setAside(sqlite + ".corrupt-20261126T180218Z", 1);
   write("/var/mobile/Library/Preferences/com.example.corrupt-x.plist", std::string(70'000, 'p'));
   const Dictionary small{{"Bytes", 65536}};
   limit({{"Pending", Dictionary{{"Bytes", 100'000}}},

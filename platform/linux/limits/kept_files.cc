@@ -30,8 +30,11 @@ std::string_view folderOf(Kept kind) {
   }
 }
 
+// A sparse or damaged file may claim any size: above all bounds, but sums must not wrap.
 std::int64_t blocksOf(const struct stat& status) {
-  return (status.st_size + kBlockBytes - 1) / kBlockBytes * kBlockBytes;
+  constexpr std::int64_t kMost = std::int64_t{1} << 41;
+  const std::int64_t size = std::min(std::int64_t{status.st_size}, kMost);
+  return (size + kBlockBytes - 1) / kBlockBytes * kBlockBytes;
 }
 
 // The names of preferences in use may contain ".corrupt-", too; those set aside end in a stamp.
@@ -152,8 +155,12 @@ KeptUse KeptFiles::use() const {
 std::vector<KeptFile>::iterator KeptFiles::beginOfStaying() {
   switch (kind_) {
     case Kept::EccEvents:
-    case Kept::SetAside:
       return list_.end();
+    case Kept::SetAside:
+      // The next run learns from a store set aside that its day is incomplete.
+      return std::ranges::find_if(list_, [&](const KeptFile& file) {
+        return file.day() >= today_ - 1 && !isAhead(file.day(), today_);
+      });
     case Kept::Records:
       return std::ranges::find(list_, today_, &KeptFile::day);
     default:

@@ -91,9 +91,9 @@ std::vector<std::int32_t> Tidy::removalOrder(const std::vector<std::int32_t>& da
   const auto lastRun = lastRunDay();
   std::vector<std::int32_t> order;
   std::ranges::copy_if(days, std::back_inserter(order), [&](std::int32_t day) {
-    if (day == today || (lastRun && day <= *lastRun)) return day != today;
-    const bool waits = day == today - 1 || (lastRun && day <= *lastRun + 2);
-    return !waits;
+    if (day == today) return false;
+    if (lastRun && day <= *lastRun) return true;
+    return day != today - 1 && !(lastRun && day <= *lastRun + 2);
   });
   std::stable_partition(order.begin(), order.end(),
                         [&](std::int32_t day) { return isAhead(day, today); });
