@@ -1,3 +1,4 @@
+#include <algorithm>
 #include <cerrno>
 #include <sys/file.h>
 #include <time.h>
@@ -91,6 +92,8 @@ Expected<bool> FileSystem::tryLock(int descriptor, const std::string& path) {
 }
 
 Status FileSystem::lock(int descriptor, const std::string& path, const LockPatience& patience) {
+  constexpr long kLongestPause = 32'000'000;  // so that a long wait hardly wakes the processor
+  timespec pause{0, 2'000'000};
   const std::int64_t end = monotonicMilliseconds() + patience.milliseconds;
   while (true) {
     const auto isLocked = tryLock(descriptor, path);
@@ -105,8 +108,8 @@ Status FileSystem::lock(int descriptor, const std::string& path, const LockPatie
       return Error{"cannot lock " + path + ": another process " + held +
                    std::string(patience.advice)};
     }
-    constexpr timespec kPause{0, 2'000'000};
-    nanosleep(&kPause, nullptr);
+    nanosleep(&pause, nullptr);
+    pause.tv_nsec = std::min(2 * pause.tv_nsec, kLongestPause);
   }
 }
 
