@@ -6,6 +6,7 @@
 #include <fcntl.h>
 #include <span>
 #include <string_view>
+#include <sys/stat.h>
 #include <thread>
 #include <unistd.h>
 #include <utility>
@@ -90,6 +91,7 @@ bool run(int argc, char** argv) {
 // The exit status is always 0: a failed run must not be restarted; there is another run the next
 // day.
 int main(int argc, char** argv) {
+  umask(022);  // the modes of files must not depend on who starts a run
   secureStandardStreams();
   if (!run(argc, argv)) pauseIfActivated();
   return 0;
