@@ -320,6 +320,18 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   EXPECT_EQ(seen, 401U);
   waitpid(other, nullptr, 0);
 
+  // Somebody who waits sees the first post after the folder was removed, but not the removal.
+  const std::string notes = root->path("/run/tavrel/notifications");
+  std::thread remover([&] {
+    for (int i = 0; i < 20; ++i)
+      std::filesystem::remove_all(notes);
+    notifications.post(kNotification);
+  });
+  EXPECT_EQ(*notifications.waitBeyond(kNotification, seen, 1h), 1U);
+  remover.join();
+  std::filesystem::remove_all(notes);
+  EXPECT_EQ(*notifications.waitBeyond(kNotification, 1, 0s), 1U);
+
   // A damaged counter does not block anybody.
   for (const char* const damaged : {"", "-1\n", "1111111111222222222233333333334444\n"}) {
     device.write("/run/tavrel/notifications/" + std::string(kNotification), damaged);

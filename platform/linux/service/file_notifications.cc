@@ -1,6 +1,7 @@
 #include "platform/linux/service/file_notifications.h"
 
 #include <algorithm>
+#include <cerrno>
 #include <charconv>
 #include <chrono>
 #include <poll.h>
@@ -24,6 +25,13 @@ std::uint64_t microsecondsSince1970() {
   using std::chrono::microseconds;
   const auto now = std::chrono::system_clock::now().time_since_epoch();
   return static_cast<std::uint64_t>(std::chrono::duration_cast<microseconds>(now).count());
+}
+
+// From `errno`. When the kernel's limit of these is reached, it gives the code of another limit.
+Error cannotWatch(const std::string& folder, const char* what) {
+  if (errno != EMFILE && errno != ENOSPC) return systemError("watch", folder);
+  return Error{format("cannot watch %s: no more inotify %s: raise fs.inotify.max_user_%s (sysctl)",
+                      folder, what, what)};
 }
 
 }  // namespace
@@ -91,16 +99,21 @@ Expected<std::uint64_t> FileNotifications::waitBeyond(std::string_view name, std
   const auto deadline =
       std::chrono::steady_clock::now() +
       std::clamp<std::chrono::milliseconds>(longest, std::chrono::milliseconds(0), kLongestWait);
-  FileSystem files;
-  if (const auto made = files.makeFolders(folder_); !made) return made.error();
   const Descriptor changes(inotify_init1(IN_CLOEXEC | IN_NONBLOCK));
-  if (!changes ||
-      inotify_add_watch(changes.get(), folder_.c_str(), IN_MOVED_TO | IN_DELETE_SELF) < 0) {
-    return systemError("watch", folder_);
-  }
+  if (!changes) return cannotWatch(folder_, "instances");
+  FileSystem files;
+  std::uint64_t before = seen;
   while (true) {
+    // Each time: somebody may have removed the folder, and with it the watch.
+    if (const auto made = files.makeFolders(folder_); !made) return made.error();
+    if (inotify_add_watch(changes.get(), folder_.c_str(), IN_MOVED_TO | IN_DELETE_SELF) < 0) {
+      if (errno == ENOENT) continue;
+      return cannotWatch(folder_, "watches");
+    }
     const auto now = count(name);
-    if (!now || *now != seen) return now;
+    if (!now) return now;
+    if (*now == 0) before = 0;  // counting begins again
+    if (*now != before) return now;
     const auto left =
         std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
     if (left.count() <= 0) return seen;

@@ -56,18 +56,19 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
   int chosen = -1;
   int fitting = 0;
   bool byName = false;
+  bool isUnfit = false;  // the one that is meant
   for (int i = 0; i < count; ++i) {
     const int descriptor = kFirstActivatedDescriptor + i;
     fcntl(descriptor, F_SETFD, FD_CLOEXEC);
     const auto index = static_cast<std::size_t>(i);
     const bool isNamed = index < names.size() && names[index] == name;
     if (!isListeningPacketSocket(descriptor)) {
-      if (isNamed) {
-        log.log(
-            LogLevel::Error,
-            "descriptor %d of LISTEN_FDS, named %s, is not a listening sequenced-packet socket: "
-            "use ListenSequentialPacket= and Accept=no in the socket unit",
-            descriptor, name);
+      if (isNamed || count == 1) {
+        log.log(LogLevel::Error,
+                "descriptor %d of LISTEN_FDS is not a listening sequenced-packet socket: use "
+                "ListenSequentialPacket= and Accept=no in the socket unit",
+                descriptor);
+        isUnfit = true;
       }
       continue;
     }
@@ -75,6 +76,7 @@ Descriptor activatedSocket(std::string_view name, SystemLog& log) {
     if (isNamed || !byName) chosen = descriptor;
     byName |= isNamed;
   }
+  if (chosen < 0 && isUnfit) return {};
   if (chosen < 0 || (!byName && fitting > 1)) {
     log.log(LogLevel::Error,
             "none of the %d sockets of LISTEN_FDS is known to be %s: set FileDescriptorName=%s "
