@@ -71,6 +71,29 @@ TEST_F(LiveMachineTest, ASensorThatBlocksHidesNoOther) {
   Descriptor(open(path.c_str(), O_WRONLY | O_NONBLOCK));  // lets the thread go
 }
 
+TEST_F(LiveMachineTest, SumsNothingWithoutADeviceThatIsSilent) {
+  const std::string battery = "/sys/class/power_supply/BAT";
+  for (const char* const number : {"0", "1", "2"}) {
+    write(battery + number + "/type", "Battery\n");
+    write(battery + number + "/charge_full", std::string(number) + "000\n");
+    write(battery + number + "/device/power/runtime_status", "active\n");
+  }
+  // As in a bay without a battery.
+  const std::string none = root.path(battery + "2/charge_full");
+  std::filesystem::remove(none);
+  std::filesystem::create_symlink("nowhere", none);
+  write("/proc/uptime", "5\n");
+  startAgain();
+  const std::string all =
+      "boot.seconds=5 BAT0.charge_full_uah=0 BAT1.charge_full_uah=1000 "
+      "battery.charge_full_uah=1000 ";
+  EXPECT_EQ(update(), all);
+  write(battery + "0/device/power/runtime_status", "suspended\n");
+  EXPECT_EQ(update(), "boot.seconds=5 BAT1.charge_full_uah=1000 ");
+  write(battery + "0/device/power/runtime_status", "active\n");
+  EXPECT_EQ(update(), all);
+}
+
 TEST_F(LiveMachineTest, FewSensorsThatBlockKeepThreadsWaiting) {
   constexpr std::size_t kWaiting = limits::kWaitingSensors;
   Lines paths;

@@ -238,7 +238,7 @@ std::optional<double> MachineSources::readTemperature() {
   });
   if (code != 0) return std::nullopt;
   std::optional<double> hottest;
-  for (const auto& text : sensors_.read(std::move(files))) {
+  for (const auto& [text, isGone] : sensors_.read(std::move(files))) {
     const auto thousandths = firstNumber<std::int64_t>(trimmed(text.value_or("")));
     if (!thousandths) continue;
     const double celsius = static_cast<double>(*thousandths) / 1000;

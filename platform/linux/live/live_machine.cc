@@ -143,8 +143,15 @@ class LiveMachine::State {
     for (std::size_t source = 0; source < sources_.size(); ++source)
       readQuick(source, wanted[source], slow, slowFiles);
     const auto texts = slowReads_.read(std::move(slowFiles));
-    for (std::size_t i = 0; i < slow.size(); ++i)
-      sources_[slow[i].first].takeText(slow[i].second, texts[i]);
+    for (std::size_t i = 0; i < slow.size(); ++i) {
+      const auto [source, file] = slow[i];
+      const auto& [text, isGone] = texts[i];
+      if (text || isGone) {
+        sources_[source].takeText(file, text);
+      } else {
+        sources_[source].takeSilence(file);
+      }
+    }
     for (std::size_t source = 0; source < sources_.size(); ++source) {
       if (!wanted[source].empty()) sources_[source].finish();
     }
@@ -174,7 +181,7 @@ class LiveMachine::State {
         if (!asked || asked->powerStatus != files[i].powerStatus) sleeps = isAsleep(files[i]);
         asked = &files[i];
         if (sleeps) {
-          source.takeText(i, std::nullopt);
+          source.takeSilence(i);
         } else {
           slow.emplace_back(index, i);
           slowFiles.push_back(slowFile(index, i));

@@ -173,7 +173,8 @@ void LiveSource::want(const LiveChannel& channel, std::vector<bool>& wanted) con
 }
 
 void LiveSource::takeText(std::size_t file, std::optional<std::string_view> text) {
-  const LiveFile& source = files_[file];
+  LiveFile& source = files_[file];
+  source.isSilent = false;
   const std::span<std::int64_t> slots = std::span(slots_).subspan(source.firstSlot, source.slots);
   std::fill(slots.begin(), slots.end(), kUnset);
   if (!text) return;
@@ -184,12 +185,25 @@ void LiveSource::takeText(std::size_t file, std::optional<std::string_view> text
   }
 }
 
+void LiveSource::takeSilence(std::size_t file) {
+  takeText(file, std::nullopt);
+  files_[file].isSilent = true;
+}
+
+bool LiveSource::isSilent(std::uint32_t slot) const {
+  const auto next = std::upper_bound(
+      files_.begin(), files_.end(), slot,
+      [](std::uint32_t wanted, const LiveFile& file) { return wanted < file.firstSlot; });
+  return next != files_.begin() && std::prev(next)->isSilent;
+}
+
 std::int64_t LiveSource::folded(const FoldedSlots& fold) const {
   std::int64_t result = kUnset;
   for (const std::uint32_t slot : fold.of) {
     const std::int64_t value = slots_[slot];
-    if (value == kUnset) continue;
-    if (result == kUnset) {
+    if (value == kUnset) {
+      if (fold.fold == Fold::Sum && isSilent(slot)) return kUnset;
+    } else if (result == kUnset) {
       result = value;
     } else {
       result = fold.fold == Fold::Sum ? saturatingSum(result, value) : std::max(result, value);

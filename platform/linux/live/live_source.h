@@ -86,6 +86,7 @@ struct LiveFile {
   std::unique_ptr<const TextReader> reader;
   Speed speed = Speed::Quick;
   std::vector<std::string> powerStatus = {};  // files that say "suspended" while it may not be read
+  bool isSilent = false;                      // its device is there, but sleeps or does not answer
 };
 
 class LiveSource {
@@ -113,7 +114,8 @@ class LiveSource {
                  Residency residency);
 
   enum class Fold : std::uint8_t { Sum, Largest };
-  /// A daily figure made of all slots that were added under its name.
+  /// A daily figure made of all slots that were added under its name. Devices that have gone do not
+  /// count; while another one is silent, there is no sum.
   void addToFold(std::string_view name, Unit unit, Fold fold, std::uint32_t slot);
   /// A line for the system log about what is not shown.
   void note(std::string line) { notes_.push_back(std::move(line)); }
@@ -146,8 +148,10 @@ class LiveSource {
   std::vector<LiveFile>& files() { return files_; }
   /// Marks the files that the channel needs in `wanted`, which has one flag for each.
   void want(const LiveChannel& channel, std::vector<bool>& wanted) const;
-  /// Stores the values of a file's text; nothing when the file could not be read.
+  /// Stores the values of a file's text; nothing when the device of the file has gone.
   void takeText(std::size_t file, std::optional<std::string_view> text);
+  /// Notes that the device of a file sleeps or does not answer.
+  void takeSilence(std::size_t file);
   /// Computes measured values and folds, after all wanted files have been read.
   void finish();
   std::span<const std::int64_t> slots() const { return slots_; }
@@ -173,6 +177,7 @@ class LiveSource {
   };
 
   std::uint32_t addSlots(std::uint32_t count);
+  bool isSilent(std::uint32_t slot) const;
   void add(const Place& place, LiveChannel channel);
   void wantSlots(std::uint32_t first, std::uint32_t count, std::vector<bool>& wanted) const;
   std::int64_t folded(const FoldedSlots& fold) const;

@@ -18,24 +18,28 @@ namespace {
 
 constexpr std::size_t kAttributeBytes = 4096;
 
-std::optional<std::string> readAll(SlowFile& file) {
+// From `errno`, such as that of a battery bay without a battery.
+SlowText failedRead() {
+  return {.isGone = errno == ENOENT || errno == ENODEV || errno == ENXIO || errno == ENODATA};
+}
+
+SlowText readAll(SlowFile& file) {
   if (!file.descriptor) {
     file.descriptor = Descriptor(open(file.path.c_str(), O_RDONLY | O_CLOEXEC | O_NOCTTY));
   }
-  if (!file.descriptor) return std::nullopt;
+  if (!file.descriptor) return failedRead();
   std::string text(kAttributeBytes, '\0');
   const ssize_t count = pread(file.descriptor.get(), text.data(), text.size(), 0);
+  const SlowText failed = count < 0 ? failedRead() : SlowText();
   if (count < 0 || !file.staysOpen) file.descriptor.reset();
-  if (count < 0) return std::nullopt;
+  if (count < 0) return failed;
   text.resize(static_cast<std::size_t>(count));
-  return text;
+  return {.text = std::move(text)};
 }
 
 // An exception that leaves a thread would end the process.
-std::optional<std::string> readSlowly(SlowFile& file) try {
-  return readAll(file);
-} catch (const std::bad_alloc&) {
-  return std::nullopt;
+SlowText readSlowly(SlowFile& file) try { return readAll(file); } catch (const std::bad_alloc&) {
+  return {};
 }
 
 }  // namespace
@@ -49,7 +53,7 @@ struct SlowReads::Round {
   std::shared_ptr<Threads> threads;
   std::condition_variable progress;
   std::vector<std::shared_ptr<SlowFile>> files;
-  std::vector<std::optional<std::string>> texts;
+  std::vector<SlowText> texts;
   std::vector<bool> isDone;
   std::size_t next = 0;
   std::size_t done = 0;
@@ -80,8 +84,7 @@ void SlowReads::work(const std::shared_ptr<Round>& round) {
   --round->threads->count;
 }
 
-std::vector<std::optional<std::string>> SlowReads::read(
-    std::vector<std::shared_ptr<SlowFile>> files) {
+std::vector<SlowText> SlowReads::read(std::vector<std::shared_ptr<SlowFile>> files) {
   using Clock = std::chrono::steady_clock;
   const std::size_t count = files.size();
   if (count == 0) return {};

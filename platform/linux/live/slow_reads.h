@@ -27,6 +27,11 @@ struct SlowFile {
   bool isWaitedFor = false;  // guarded by the mutex of all readings
 };
 
+struct SlowText {
+  std::optional<std::string> text = {};
+  bool isGone = false;  // there is no device, or it has no such figure, rather than no answer
+};
+
 struct Patience {
   int oneMilliseconds;
   int allMilliseconds;
@@ -36,9 +41,9 @@ class SlowReads {
  public:
   SlowReads(SystemLog& log, Patience patience);
 
-  /// The texts of all files, in their order; nothing for those that failed or did not answer. A log
+  /// The texts of all files, in their order; none for those that failed or did not answer. A log
   /// line names those that did not answer.
-  std::vector<std::optional<std::string>> read(std::vector<std::shared_ptr<SlowFile>> files);
+  std::vector<SlowText> read(std::vector<std::shared_ptr<SlowFile>> files);
 
  private:
   struct Threads;
