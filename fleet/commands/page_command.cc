@@ -21,6 +21,9 @@ void addPageCommand(Command top, FleetContext& context) {
       .required();
   addQuestionOptions(command, *options);
   command.onRun([&context, options] {
+    if (const Status usable = checkOutput(options->output); !usable) {
+      return context.fail(usable.error().message);
+    }
     ask(context, *options, [&](Question& question) {
       const std::string text =
           textOf(askForPage(question.engine(), question.ledger(), question.days()));

@@ -408,6 +408,9 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   openEngine(empty, OpenMode::Write);
   EXPECT_EQ(run(empty, "summary").error,
             "tavrel-fleet: " + empty + ": holds no logs: load some with tavrel-fleet load\n");
+  EXPECT_EQ(run(empty, "page -o /none/x").error,
+            "tavrel-fleet: cannot write /none/x: /none: No such file or directory: create this "
+            "folder\n");
 }
 
 }  // namespace

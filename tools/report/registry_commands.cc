@@ -142,6 +142,9 @@ void record(ToolContext& context, const Arguments& arguments) {
   if (arguments.seconds > 0 && !arguments.live) {
     return context.failUsage("--seconds is for --live: recordings are written as they are");
   }
+  if (const Status usable = checkOutput(arguments.file); !usable) {
+    return context.fail(usable.error().message);
+  }
   const CurrentRecording current =
       arguments.live ? CurrentRecording{recordLive(context, arguments.seconds), true}
                      : currentRecording(context);

@@ -10,11 +10,8 @@
 
 namespace tavrel {
 
-Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes) {
-  if (file == "-") {
-    output.out() << bytes;
-    return Done{};
-  }
+Status checkOutput(const std::string& file) {
+  if (file == "-") return Done{};
   // Nobody intends to replace a device or a pipe with a file.
   const auto status = FileSystem::status(file);
   if (status && !S_ISREG(status->st_mode)) {
@@ -27,14 +24,22 @@ Status writeOutput(ToolOutput& output, const std::string& file, std::string_view
   if (std::filesystem::is_symlink(file, ignored)) {
     return Error{format("cannot write %s: it is a symbolic link: name its target", file)};
   }
-  const auto path = std::filesystem::absolute(file);
   // A missing folder is probably a typing error, so do not make it.
-  const auto folder = path.parent_path().string();
+  const auto folder = std::filesystem::absolute(file).parent_path().string();
   if (!FileSystem::status(folder)) {
     const std::string reason = systemText(errno);
     return Error{format("cannot write %s: %s: %s: create this folder", file, folder, reason)};
   }
-  return FileSystem().replace(path.string(), asBytes(bytes), 0644);
+  return Done{};
+}
+
+Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes) {
+  if (Status usable = checkOutput(file); !usable) return usable;
+  if (file == "-") {
+    output.out() << bytes;
+    return Done{};
+  }
+  return FileSystem().replace(std::filesystem::absolute(file).string(), asBytes(bytes), 0644);
 }
 
 }  // namespace tavrel

@@ -9,6 +9,9 @@
 
 namespace tavrel {
 
+/// Whether `writeOutput` takes the file, for commands that work long before they write.
+Status checkOutput(const std::string& file);
+
 /// Atomically replaces the content of a file of this machine with `bytes`; "-" is standard output.
 /// The folder must exist. Refuses to replace anything but a regular file.
 Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes);
