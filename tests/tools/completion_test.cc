@@ -96,6 +96,8 @@ TEST_F(CompletionTest, CompletesValues) {
       {"prefs get com.example.domain ", {}},
       {"log show log", {"log-tallied-20261127T180218Z-5f0c9a1e"}},
       {"log show " + device.path("/folder/f"), {device.path("/folder/file.log")}},
+      {"whitelist diff " + device.path("/folder/f"), {device.path("/folder/file.log")}},
+      {"whitelist diff x " + device.path("/folder/f"), {device.path("/folder/file.log")}},
       {"--root " + device.path("/fol"), {device.path("/folder")}},
       {"--root=" + device.path("/fol"), {device.path("/folder")}},
       {"--root=" + device.path("/folder") + " stat show com", {}},

@@ -84,7 +84,10 @@ CompletedProgram completedProgram(const Command& program) {
           .anywhere = "--root",
           .lists = {{"DAY", "days"}, {"KEY", "keys"}, {"PREFIX", "keys"}, {"DOMAIN", "domains"}},
           // Keys of preferences are not keys of statistics.
-          .exceptions = {{"prefs", "KEY", "none"}, {"log show", "FILE", "logs"}}};
+          .exceptions = {{"prefs", "KEY", "none"},
+                         {"log show", "FILE", "logs"},
+                         {"whitelist diff", "OLD", "files"},
+                         {"whitelist diff", "NEW", "files"}}};
 }
 
 }  // namespace
