@@ -79,9 +79,10 @@ TEST(Usage, MistakesEndWithStatus2AndOneLine) {
                     "/: No such file or directory: name the device's folder with "
                     "TAVREL_ROOT or --root"));
   }
-  device.check("registry record --live " + none + "/x",
-               fails("cannot write " + none + "/x: " + none +
-                     ": No such file or directory: create this folder"));
+  for (const std::string command : {"registry record --live ", "stat collect --once --state "}) {
+    device.check(command + none + "/x", fails("cannot write " + none + "/x: " + none +
+                                              ": No such file or directory: create this folder"));
+  }
   EXPECT_EQ(device.runAt("", "status"),
             fails("--root: names no folder: see 'tavrelctl status --help'", 2));
   EXPECT_FALSE(std::filesystem::exists(none));

@@ -10,6 +10,13 @@
 
 namespace tavrel {
 
+Status checkFolder(const std::string& file) {
+  const auto folder = std::filesystem::absolute(file).parent_path().string();
+  if (FileSystem::status(folder)) return Done{};
+  const std::string reason = systemText(errno);
+  return Error{format("cannot write %s: %s: %s: create this folder", file, folder, reason)};
+}
+
 Status checkOutput(const std::string& file) {
   if (file == "-") return Done{};
   // Nobody intends to replace a device or a pipe with a file.
@@ -24,13 +31,7 @@ Status checkOutput(const std::string& file) {
   if (std::filesystem::is_symlink(file, ignored)) {
     return Error{format("cannot write %s: it is a symbolic link: name its target", file)};
   }
-  // A missing folder is probably a typing error, so do not make it.
-  const auto folder = std::filesystem::absolute(file).parent_path().string();
-  if (!FileSystem::status(folder)) {
-    const std::string reason = systemText(errno);
-    return Error{format("cannot write %s: %s: %s: create this folder", file, folder, reason)};
-  }
-  return Done{};
+  return checkFolder(file);
 }
 
 Status writeOutput(ToolOutput& output, const std::string& file, std::string_view bytes) {

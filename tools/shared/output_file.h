@@ -9,6 +9,9 @@
 
 namespace tavrel {
 
+/// Whether a file's folder exists. A missing one is probably a typing error, so do not make it.
+Status checkFolder(const std::string& file);
+
 /// Whether `writeOutput` takes the file, for commands that work long before they write.
 Status checkOutput(const std::string& file);
 

@@ -8,6 +8,7 @@
 
 #include "platform/platform.h"
 #include "tools/shared/day_argument.h"
+#include "tools/shared/output_file.h"
 #include "tools/shared/subcommand.h"
 #include "tools/stat/collect.h"
 #include "tools/stat/machine_statistics.h"
@@ -106,11 +107,17 @@ struct CollectArguments {
 };
 
 void collect(ToolContext& context, const CollectArguments& arguments) {
+  if (!arguments.stateFile.empty()) {
+    if (!arguments.once && !arguments.period)
+      return context.failUsage("--state needs --once or --every");
+    if (const Status found = checkFolder(arguments.stateFile); !found) {
+      return context.fail(found.error().message);
+    }
+  }
   if (arguments.once) return collectOnce(context, arguments.stateFile);
   if (arguments.period) {
     return collectEvery(context, std::chrono::seconds(*arguments.period), arguments.stateFile);
   }
-  if (!arguments.stateFile.empty()) return context.failUsage("--state needs --once or --every");
   collectStatistics(context, arguments.seconds);
 }
 
