@@ -1,5 +1,6 @@
 #include "fleet/commands/load_command.h"
 
+#include <filesystem>
 #include <memory>
 #include <nlohmann/json.hpp>
 #include <ostream>
@@ -73,6 +74,13 @@ void load(FleetContext& context, const LoadOptions& options) {
     for (const std::string& path : *named) {
       if (struct stat status{}; stat(path.c_str(), &status) != 0)
         return context.fail(systemError("read", path).message + ": check the path");
+    }
+  }
+  for (const std::string& path : options.request.paths) {
+    std::error_code missing;
+    if (std::filesystem::equivalent(path, options.setAside, missing)) {
+      return context.failUsage(
+          format("--set-aside: %s is loaded itself: name another folder", options.setAside));
     }
   }
   const auto engine = context.openDatabase(OpenMode::Write);
