@@ -30,10 +30,15 @@ struct Services : DeviceServices {
 
 struct ServicesTest : testing::Test, Services {};
 
-TEST_F(ServicesTest, ProgramsThatRunOutOfMemorySaySo) {
+TEST_F(ServicesTest, ProgramsThatRunOutOfMemoryOrLoseTheirOutputSaySo) {
   const auto runsOut = []() -> int { throw std::bad_alloc(); };
   EXPECT_EXIT(std::exit(exitStatusOf("name", runsOut)), testing::ExitedWithCode(1),
               "^name: out of memory\n$");
+  const auto losesOutput = [] {
+    return std::freopen("/dev/full", "w", stdout) != nullptr && std::puts("x") >= 0 ? 0 : 9;
+  };
+  EXPECT_EXIT(std::exit(exitStatusOf("name", losesOutput)), testing::ExitedWithCode(1),
+              "^name: cannot write standard output: free space or check the pipe\n$");
   EXPECT_EQ(loggedStatusOf(log, "work", runsOut), 1);
   EXPECT_EQ(log.lines, (Lines{"work ended early: std::bad_alloc"}));
 }

@@ -8,6 +8,7 @@
 #include <unistd.h>
 #include <utility>
 
+#include "base/program.h"
 #include "platform/linux/system_log/linux_system_log.h"
 #include "tools/shared/table.h"
 
@@ -104,7 +105,7 @@ void ToolOutput::finish() {
   streams_.out.flush();
   if (streams_.out) return;
   const int found = exitStatus_;
-  fail("cannot write standard output: free space or check the pipe");
+  fail(kOutputIsLost);
   if (found != kExitSuccess) exitStatus_ = found;
 }
 
