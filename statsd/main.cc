@@ -62,7 +62,11 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
     complain(message);
     return 2;
   };
-  for (int found = 0; (found = getopt_long(argc, argv, "h", kOptions, nullptr)) != -1;) {
+  for (;;) {
+    const char* const word = argv[optind];
+    // '+' takes the words in order, and ':' leaves messages to this function.
+    const int found = getopt_long(argc, argv, "+:h", kOptions, nullptr);
+    if (found == -1) break;
     switch (found) {
       case kUdp: {
         const auto port = parseNumber<std::uint16_t>(optarg);
@@ -96,8 +100,10 @@ std::optional<int> parseOptions(int argc, char** argv, Options& options) {
       case kShowHelp:
         std::fputs(kHelp, stdout);
         return 0;
-      default:  // getopt has said what is wrong
-        return misuse("see --help");
+      case ':':
+        return misuse(format("%s needs a value: see --help", word));
+      default:
+        return refuseArgument("tavrel-statsd", word);
     }
   }
   if (optind < argc) return refuseArgument("tavrel-statsd", argv[optind]);

@@ -68,7 +68,11 @@ int run(int argc, char** argv) {
                                  {"version", no_argument, nullptr, 'v'},
                                  {nullptr, 0, nullptr, 0}};
   bool atOnce = false;
-  for (int found = 0; (found = getopt_long(argc, argv, "h", kOptions, nullptr)) != -1;) {
+  for (;;) {
+    const char* const word = argv[optind];
+    // '+' takes the words in order, and ':' leaves messages to this function.
+    const int found = getopt_long(argc, argv, "+:h", kOptions, nullptr);
+    if (found == -1) break;
     switch (found) {
       case 'n':
         atOnce = true;
@@ -79,9 +83,8 @@ int run(int argc, char** argv) {
       case 'v':
         std::printf("tavrel-upload %s\n", std::string(version()).c_str());
         return kDone;
-      default:  // getopt has said what is wrong
-        std::fputs("tavrel-upload: see --help\n", stderr);
-        return kMisused;
+      default:
+        return refuseArgument("tavrel-upload", word);
     }
   }
   if (optind < argc) return refuseArgument("tavrel-upload", argv[optind]);

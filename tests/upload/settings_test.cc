@@ -230,8 +230,11 @@ TEST(Upload, TellsTheServiceManagerHowItEnded) {
   EXPECT_TRUE(
       device.state().failure.ends_with(": it is not named like a log of this system; "
                                        "remove it"));
-  for (const char* arguments : {"--then", "then"})
-    EXPECT_EQ(run(arguments), 2);
+  for (const std::string argument : {"--then", "--now=1", "then"}) {
+    EXPECT_EQ(run(argument), 2);
+    EXPECT_EQ(contentOf(device.root.path("/said")),
+              "tavrel-upload: unexpected argument '" + argument + "': see --help\n");
+  }
   EXPECT_EQ(run("--version"), 0);
   EXPECT_EQ(run("", "/missing"), 1);
   device.configure("");

@@ -195,6 +195,9 @@ TEST_F(Statsd, OpensSocketsOfItsOwnAndRefusesWhatItCannotUse) {
       {"--prefix 'a b'", 2,
        "not a prefix: a b: give letters, digits, '.', '_' and '-', at most 200\n"},
       {"--idle 86401", 2, "not a time: 86401: give 0 to 86400 seconds\n"},
+      {"--udp 65535 --idle", 2, "--idle needs a value: see --help\n"},
+      {"--frob x", 2, "unexpected argument '--frob': see --help\n"},
+      {"-xy", 2, "unexpected argument '-xy': see --help\n"},
       {"--idle 86400 --udp 65535 x", 2, "unexpected argument 'x': see --help\n"}};
   EXPECT_EQ(outputOf("TAVREL_ROOT=/none " + kProgram, 1),
             "tavrel-statsd: cannot use device root /none: No such file or directory: name the "
