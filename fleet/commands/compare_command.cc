@@ -191,8 +191,9 @@ void addCompareCommand(Command top, FleetContext& context) {
   auto options = std::make_shared<CompareOptions>();
   command.addOption("OLD", options->before, "The earlier version, or a part of its name")
       .typeName("")
-      .required();
-  command.addOption("NEW", options->after, "The later version").typeName("").required();
+      .required()
+      .notEmpty();
+  command.addOption("NEW", options->after, "The later version").typeName("").required().notEmpty();
   addQuestionOptions(command, *options);
   addFormOptions(command, context, *options);
   command.addFlag("--all", options->all, "Also list the statistics that did not change");

@@ -77,7 +77,7 @@ std::vector<ShowAnswer> answers(Question& question, const ShowOptions& options) 
 void addShowCommand(Command top, FleetContext& context) {
   const Command command = top.addCommand("show", "Show how one statistic is distributed");
   auto options = std::make_shared<ShowOptions>();
-  command.addOption("KEY", options->key, "The statistic").typeName("").required();
+  command.addOption("KEY", options->key, "The statistic").typeName("").required().notEmpty();
   command.addOption("--by", options->by, "Divide the devices")
       .typeName("WHAT")
       .oneOf({"none", "os", "region", "day", "digest"})

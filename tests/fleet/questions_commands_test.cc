@@ -351,6 +351,9 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
       " is in no log, or in logs of fewer than 10 devices: tavrel-fleet summary";
   const std::tuple<CommandLine, int, std::string> cases[] = {
       {"show x\x1b", 1, "statistic \"x\\x1b\"" + few + " --keys lists the statistics"},
+      {{"show", ""}, 2, "KEY: must not be empty: see 'tavrel-fleet show --help'"},
+      {{"compare", "", "4.9"}, 2, "OLD: must not be empty: see 'tavrel-fleet compare --help'"},
+      {{"compare", "4.9", ""}, 2, "NEW: must not be empty: see 'tavrel-fleet compare --help'"},
       {"show rare --days 1", 1, "statistic \"rare\"" + few + " --keys lists the statistics"},
       {"show =sum --against 1", 2,
        "--against: 2026-11-24 and all days overlap: choose separate days with --days; for a "

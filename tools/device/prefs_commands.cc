@@ -110,6 +110,7 @@ void get(ToolContext& context, const Arguments& arguments) {
 Expected<plist::Value> valueOf(ToolContext& context, const Arguments& arguments) {
   if (!arguments.isDocument) return parseArgument(arguments.value, arguments.kind);
   if (arguments.value == "-") return readDocument(context, "-");
+  if (arguments.value == "@") return Error{"no file after @: write @FILE"};
   if (arguments.value.starts_with('@')) return readDocument(context, arguments.value.substr(1));
   return decodeDocument(arguments.value, "VALUE");
 }
@@ -127,9 +128,6 @@ void noteTextThatReadsOtherwise(ToolContext& context, const Arguments& arguments
 
 void set(ToolContext& context, const Arguments& arguments) {
   if (!checkDomain(context, arguments.domain)) return;
-  if (arguments.key.empty()) {
-    return context.failUsage("a preference needs a key: the one given is empty");
-  }
   const auto value = valueOf(context, arguments);
   if (!value) return context.failUsage(value.error().message);
   if (!plist::isEncodable(arguments.key, plist::Alphabet::Xml) || !hasXmlTextsOnly(*value)) {
@@ -225,7 +223,7 @@ void addPrefsCommands(Command app, ToolContext& context) {
     return command.addOption("DOMAIN", arguments->domain, "Preference domain").notEmpty();
   };
   const auto addKey = [&](Command command) {
-    command.addOption("KEY", arguments->key, "Preference key").required();
+    command.addOption("KEY", arguments->key, "Preference key").required().notEmpty();
   };
 
   const Command getCommand = add("get", "Print the value of a key", get);
