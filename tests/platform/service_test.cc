@@ -1,3 +1,4 @@
+#include <atomic>
 #include <chrono>
 #include <sys/mman.h>
 #include <sys/resource.h>
@@ -307,7 +308,7 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   constexpr std::string_view kNotification = "com.norvane.tallied.tavrel.logging";
   FileNotifications notifications(*root, log);
   notifications.post(kNotification);
-  EXPECT_EQ(*notifications.waitBeyond(kNotification, 0, 1h), 1U);
+  EXPECT_EQ(**notifications.waitBeyond(kNotification, 0, 1h), 1U);
 
   // Another process posts while this one posts and waits for the last post.
   const pid_t other = fork();
@@ -316,21 +317,35 @@ TEST_F(ServiceTest, NotificationsCountAndWakeThoseWhoWait) {
   if (other == 0) _exit(0);
   std::uint64_t seen = 1;
   while (seen < 401)
-    seen = *notifications.waitBeyond(kNotification, seen, 1h);
+    seen = **notifications.waitBeyond(kNotification, seen, 1h);
   EXPECT_EQ(seen, 401U);
   waitpid(other, nullptr, 0);
 
   // Somebody who waits sees the first post after the folder was removed, but not the removal.
   const std::string notes = root->path("/run/tavrel/notifications");
-  std::thread remover([&] {
-    for (int i = 0; i < 20; ++i)
-      std::filesystem::remove_all(notes);
-    notifications.post(kNotification);
-  });
-  EXPECT_EQ(*notifications.waitBeyond(kNotification, seen, 1h), 1U);
-  remover.join();
+  for (const std::uint64_t before : {seen, std::uint64_t{1}}) {
+    std::atomic<bool> hasSeen = false;
+    std::thread remover([&] {
+      // Again, in case the other thread looks only after the post.
+      while (!hasSeen) {
+        std::filesystem::remove_all(notes);
+        while (!hasSeen && !std::filesystem::exists(notes))
+          std::this_thread::yield();
+        notifications.post(kNotification);
+      }
+    });
+    EXPECT_EQ(**notifications.waitBeyond(kNotification, before, 1h), 1U);
+    hasSeen = true;
+    remover.join();
+  }
+  const std::uint64_t last = *notifications.count(kNotification);
+  EXPECT_FALSE(*notifications.waitBeyond(kNotification, last, 0s));
   std::filesystem::remove_all(notes);
-  EXPECT_EQ(*notifications.waitBeyond(kNotification, 1, 0s), 1U);
+  EXPECT_FALSE(*notifications.waitBeyond(kNotification, 1, 0s));
+  std::filesystem::remove_all(notes);
+  std::filesystem::create_symlink("nowhere", notes);
+  EXPECT_FALSE(notifications.waitBeyond(kNotification, 1, 1h));
+  std::filesystem::remove(notes);
 
   // A damaged counter does not block anybody.
   for (const char* const damaged : {"", "-1\n", "1111111111222222222233333333334444\n"}) {

@@ -299,7 +299,7 @@ TEST(DaemonTest, ServesAClientWithTheSocketOfTheServiceManager) {
   ASSERT_TRUE(client) << client.error().message;
   ASSERT_TRUE(client->send({{"operation", 0}}));
   const auto asked = notifications.waitBeyond(kLoggingNotification, 0, std::chrono::seconds(60));
-  ASSERT_TRUE(asked && *asked == 1U);
+  ASSERT_TRUE(asked && **asked == 1U);
   const std::string uuid = "00112233-4455-6677-8899-AABBCCDDEEFF";
   const Dictionary app{{"bundle_id", "com.example.walk"}, {"version", "1.2"}, {"uuid", uuid}};
   ASSERT_TRUE(client->send({{"operation", 2}, {"app_data", Array{app}}}));

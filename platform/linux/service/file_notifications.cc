@@ -93,8 +93,8 @@ Expected<std::uint64_t> FileNotifications::count(std::string_view name) const {
   return number;
 }
 
-Expected<std::uint64_t> FileNotifications::waitBeyond(std::string_view name, std::uint64_t seen,
-                                                      std::chrono::milliseconds longest) const {
+Expected<std::optional<std::uint64_t>> FileNotifications::waitBeyond(
+    std::string_view name, std::uint64_t seen, std::chrono::milliseconds longest) const {
   constexpr std::chrono::hours kLongestWait{24 * 365};
   const auto deadline =
       std::chrono::steady_clock::now() +
@@ -103,20 +103,24 @@ Expected<std::uint64_t> FileNotifications::waitBeyond(std::string_view name, std
   if (!changes) return cannotWatch(folder_, "instances");
   FileSystem files;
   std::uint64_t before = seen;
+  // How often the folder may vanish between being made and being watched.
+  constexpr int kMostAttempts = 100;
+  int attempts = 0;
   while (true) {
     // Each time: somebody may have removed the folder, and with it the watch.
     if (const auto made = files.makeFolders(folder_); !made) return made.error();
     if (inotify_add_watch(changes.get(), folder_.c_str(), IN_MOVED_TO | IN_DELETE_SELF) < 0) {
-      if (errno == ENOENT) continue;
+      if (errno == ENOENT && ++attempts < kMostAttempts) continue;
       return cannotWatch(folder_, "watches");
     }
+    attempts = 0;
     const auto now = count(name);
-    if (!now) return now;
+    if (!now) return now.error();
     if (*now == 0) before = 0;  // counting begins again
-    if (*now != before) return now;
+    if (*now != before) return std::optional(*now);
     const auto left =
         std::chrono::ceil<std::chrono::milliseconds>(deadline - std::chrono::steady_clock::now());
-    if (left.count() <= 0) return seen;
+    if (left.count() <= 0) return std::optional<std::uint64_t>();
     pollfd state{.fd = changes.get(), .events = POLLIN, .revents = 0};
     poll(&state, 1, static_cast<int>(std::min<std::int64_t>(left.count(), 1 << 30)));
     alignas(inotify_event) char events[4096];

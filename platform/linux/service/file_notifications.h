@@ -36,10 +36,10 @@ class FileNotifications final : public Notifications {
   /// How often `name` was posted; 0 when never.
   Expected<std::uint64_t> count(std::string_view name) const;
 
-  /// Waits until the count differs from `seen` and returns it, or `seen` when the time is up. A
+  /// Waits until the count differs from `seen` and returns it; nothing when the time is up. A
   /// counter that is removed meanwhile is no difference; its first post is one.
-  Expected<std::uint64_t> waitBeyond(std::string_view name, std::uint64_t seen,
-                                     std::chrono::milliseconds longest) const;
+  Expected<std::optional<std::uint64_t>> waitBeyond(std::string_view name, std::uint64_t seen,
+                                                    std::chrono::milliseconds longest) const;
 
  private:
   Expected<std::string> pathOf(std::string_view name) const;
