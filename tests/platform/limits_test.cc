@@ -286,7 +286,7 @@ TEST_F(LimitsTest, RemovesFilesFromTheOldestOn) {
   };
   setAside(sqlite + "-kept-damaged", 2);
   setAside("/var/lib/tavrel/ecc-events/c.event.unusable", -2);
-  setAside(sqlite + ".corrupt-20261126T180218Z", 1);
+  setAside(sqlite + ".corrupt-20261126T180218Z", 5);
   write("/var/mobile/Library/Preferences/com.example.corrupt-x.plist", std::string(70'000, 'p'));
   const Dictionary small{{"Bytes", 65536}};
   limit({{"Pending", Dictionary{{"Bytes", 100'000}}},

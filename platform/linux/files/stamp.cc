@@ -18,6 +18,14 @@ std::string compactStamp(plist::Date instant) {
                 time.hour, time.minute, time.second);
 }
 
+std::optional<std::int64_t> dayInStamp(std::string_view stamp) {
+  constexpr std::size_t kDateDigits = 8;
+  if (stamp.size() <= kDateDigits || stamp[kDateDigits] != 'T') return std::nullopt;
+  const auto date =
+      parseDate(format("%s-%s-%s", stamp.substr(0, 4), stamp.substr(4, 2), stamp.substr(6, 2)));
+  return date ? std::optional(daysFromCivil(*date)) : std::nullopt;
+}
+
 std::string preciseStamp(plist::Date instant) {
   const std::int64_t seconds = wholeSeconds(instant);
   const CivilTime time = civilFromSeconds(seconds);

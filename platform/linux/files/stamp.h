@@ -2,7 +2,9 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
 #include <string>
+#include <string_view>
 
 #include "base/plist.h"
 
@@ -13,6 +15,9 @@ std::int64_t wholeSeconds(plist::Date instant);
 
 /// "20261116T180218Z", for file names.
 std::string compactStamp(plist::Date instant);
+
+/// The UTC day, since 1970, of a text that begins with such a stamp.
+std::optional<std::int64_t> dayInStamp(std::string_view stamp);
 
 /// "2026-11-16T18:02:18.123Z", milliseconds cut off.
 std::string preciseStamp(plist::Date instant);

@@ -7,6 +7,7 @@
 
 #include "base/civil_time.h"
 #include "platform/linux/device/ecc_events.h"
+#include "platform/linux/files/stamp.h"
 #include "platform/linux/logs/record_file_name.h"
 #include "platform/linux/preferences/file_preferences.h"
 
@@ -15,6 +16,7 @@ namespace {
 
 constexpr std::string_view kSetAsideFolders[] = {"/var/mobile/Library/Brimhold", kPreferencesFolder,
                                                  kEccEventFolder};
+constexpr std::string_view kSetAsideMark = ".corrupt-";  // a stamp follows
 constexpr std::int64_t kBlockBytes = 4096;
 
 std::string_view folderOf(Kept kind) {
@@ -39,7 +41,7 @@ std::int64_t blocksOf(const struct stat& status) {
 
 // The names of preferences in use may contain ".corrupt-", too; those set aside end in a stamp.
 bool isSetAside(std::string_view name) {
-  return (name.find(".corrupt-") != name.npos && !name.ends_with(".plist")) ||
+  return (name.find(kSetAsideMark) != name.npos && !name.ends_with(".plist")) ||
          name.ends_with("-kept-damaged") || name.ends_with(".unusable");
 }
 
@@ -135,7 +137,14 @@ Status KeptFiles::listSetAside(const std::string& folder) {
   for (const std::string& name : *names) {
     if (!isSetAside(name)) continue;
     const auto status = FileSystem::status(folder + '/' + name);
-    if (status) add(folder + '/' + name, std::int64_t{status->st_mtim.tv_sec});
+    if (!status) continue;
+    // A store may have been set aside long after its last change.
+    const auto stamp = std::string_view(name).find(kSetAsideMark);
+    const auto day = stamp == name.npos
+                         ? std::nullopt
+                         : dayInStamp(std::string_view(name).substr(stamp + kSetAsideMark.size()));
+    add(folder + '/' + name,
+        std::max(std::int64_t{status->st_mtim.tv_sec}, day.value_or(0) * kSecondsPerDay));
   }
   return Done{};
 }

@@ -53,7 +53,7 @@ class KeptFiles {
 
   /// Removes what exceeds the bounds, first the files that do so alone. In place of a file that
   /// cannot be removed, the next ones go. The newest log, the records of `today`, and what was set
-  /// aside and last changed today or yesterday always stay, and do not count when they alone exceed
+  /// aside or last changed today or yesterday always stay, and do not count when they alone exceed
   /// the bound. Also removes metadata that a killed process left without its log.
   TrimmedFiles trim(const Bounds& bounds);
 

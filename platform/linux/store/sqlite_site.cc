@@ -37,15 +37,6 @@ StoreFailure lossOf(const std::string& file) {
                                    ", which is damaged: inspect or remove that file"};
 }
 
-// The day in the name of a store that was set aside, from its stamp, "YYYYMMDDT...".
-std::optional<std::int64_t> dayInStamp(std::string_view stamp) {
-  constexpr std::size_t kDateDigits = 8;
-  if (stamp.size() <= kDateDigits || stamp[kDateDigits] != 'T') return std::nullopt;
-  const auto date =
-      parseDate(format("%s-%s-%s", stamp.substr(0, 4), stamp.substr(4, 2), stamp.substr(6, 2)));
-  return date ? std::optional(daysFromCivil(*date)) : std::nullopt;
-}
-
 bool moveFile(const std::string& from, const std::string& to) {
   return rename(from.c_str(), to.c_str()) == 0 || errno == ENOENT;
 }
