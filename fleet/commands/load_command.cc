@@ -78,7 +78,9 @@ void load(FleetContext& context, const LoadOptions& options) {
   }
   for (const std::string& path : options.request.paths) {
     std::error_code missing;
-    if (std::filesystem::equivalent(path, options.setAside, missing)) {
+    const auto folder = std::filesystem::absolute(path).parent_path();
+    if (std::filesystem::equivalent(path, options.setAside, missing) ||
+        std::filesystem::equivalent(folder, options.setAside, missing)) {
       return context.failUsage(
           format("--set-aside: %s is loaded itself: name another folder", options.setAside));
     }

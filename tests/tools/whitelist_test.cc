@@ -23,7 +23,7 @@ TEST_F(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
         "types": {"sig_fig": "2", "bucket_interval": 2.5}}},
     "B": {"DistributionKeys": {"d": {"sig_fig": 1, "intervals": 3},
                                "e": {"intervals": [1, 1, "x", {"$real": "nan"}, 0, 2.5,
-                                                   {"$real": "inf"}]}},
+                                                   {"$real": "inf"}, 5]}},
       "ScalarKeyPrefixes": {"p.": {}, "p.q.": {"sig_fig": 1}, "p.q.r": {"sig_fig": 1},
                             "p.s": {"sig_fig": 1}, "": {}},
       "DistributionKeyPrefixes": {"e.": {}},
@@ -48,7 +48,8 @@ B/DistributionKeys/e/intervals/1: is 1, not above the boundaries before it: its 
 B/DistributionKeys/e/intervals/2: is a string: expected a number: its bucket stays empty, and tavrel-fleet may refuse the logs
 B/DistributionKeys/e/intervals/3: is not a number: its bucket stays empty, and tavrel-fleet may refuse the logs
 B/DistributionKeys/e/intervals/4: is 0, not above the boundaries before it: its bucket stays empty, and tavrel-fleet may refuse the logs
-B/DistributionKeys/e/intervals/6: is infinite: leave it out, the outer buckets are open already
+B/DistributionKeys/e/intervals/6: is infinite: leave it out, the outer buckets are open already, and tavrel-fleet may refuse the logs
+B/DistributionKeys/e/intervals/7: is 5, not above the boundaries before it: its bucket stays empty, and tavrel-fleet may refuse the logs
 B/ScalarKeyPrefixes/: is the empty prefix: every key begins with it
 B/ScalarKeyPrefixes/: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
 B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended

@@ -197,7 +197,9 @@ class Checker {
       } else if (std::isnan(number->real())) {
         add("is not a number: its bucket stays empty, and tavrel-fleet may refuse the logs");
       } else if (std::isinf(number->real())) {
-        add("is infinite: leave it out, the outer buckets are open already");
+        add("is infinite: leave it out, the outer buckets are open already, and tavrel-fleet may "
+            "refuse the logs");
+        largest = std::max(largest, number->real());
       } else if (index > 0 && number->real() <= largest) {
         add(
             format("is %s, not above the boundaries before it: its bucket stays empty, and "
