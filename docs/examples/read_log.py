@@ -25,7 +25,7 @@ for path in sys.argv[1:]:
     for key, value in [*log["BHMetadata"].items(), *log["BHScalars"].items()]:
         print(f"  {key} = {value}")
     for key, (low, high, mean, squares, count) in log["BHDistributions"].items():
-        deviation = math.sqrt(squares / count) if count and squares >= 0 else 0.0
+        deviation = math.nan if squares < 0 else math.sqrt(squares / max(count, 1))
         print(f"  {key}: {count} from {low} to {high}, mean {mean}, deviation {deviation:.4g}")
         histogram = log["BHDistributionsHistogram"].get(key, {})
         for label, values in sorted(histogram.items(), key=lower_end):

@@ -223,17 +223,17 @@ void addPrefsCommands(Command app, ToolContext& context) {
     return command.addOption("DOMAIN", arguments->domain, "Preference domain").notEmpty();
   };
   const auto addKey = [&](Command command) {
-    command.addOption("KEY", arguments->key, "Preference key").required().notEmpty();
+    return command.addOption("KEY", arguments->key, "Preference key").required();
   };
 
   const Command getCommand = add("get", "Print the value of a key", get);
   addDomain(getCommand).required();
-  addKey(getCommand);
+  addKey(getCommand).notEmpty();
   context.addJsonOption(getCommand);
 
   const Command setCommand = add("set", "Set a key", set);
   addDomain(setCommand).required();
-  addKey(setCommand);
+  addKey(setCommand).notEmpty();
   setCommand.addOption("VALUE", arguments->value, "The value").required();
   addKindOptions(setCommand, arguments);
   setCommand.addFlag("--force", arguments->force,
