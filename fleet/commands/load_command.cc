@@ -77,10 +77,12 @@ void load(FleetContext& context, const LoadOptions& options) {
     }
   }
   for (const std::string& path : options.request.paths) {
+    // Loading a folder within it does not load what is set aside.
     std::error_code missing;
-    const auto folder = std::filesystem::absolute(path).parent_path();
-    if (std::filesystem::equivalent(path, options.setAside, missing) ||
-        std::filesystem::equivalent(folder, options.setAside, missing)) {
+    const bool isFolder = std::filesystem::is_directory(path, missing);
+    const auto place =
+        isFolder ? std::filesystem::path(path) : std::filesystem::absolute(path).parent_path();
+    if (std::filesystem::equivalent(place, options.setAside, missing)) {
       return context.failUsage(
           format("--set-aside: %s is loaded itself: name another folder", options.setAside));
     }

@@ -30,16 +30,23 @@ SlowText readAll(SlowFile& file) {
   if (!file.descriptor) return failedRead();
   std::string text(kAttributeBytes, '\0');
   const ssize_t count = pread(file.descriptor.get(), text.data(), text.size(), 0);
-  const SlowText failed = count < 0 ? failedRead() : SlowText();
-  if (count < 0 || !file.staysOpen) file.descriptor.reset();
-  if (count < 0) return failed;
+  if (count < 0) {
+    const SlowText failed = failedRead();
+    file.descriptor.reset();
+    return failed;
+  }
+  if (!file.staysOpen) file.descriptor.reset();
   text.resize(static_cast<std::size_t>(count));
   return {.text = std::move(text)};
 }
 
 // An exception that leaves a thread would end the process.
-SlowText readSlowly(SlowFile& file) try { return readAll(file); } catch (const std::bad_alloc&) {
-  return {};
+SlowText readSlowly(SlowFile& file) {
+  try {
+    return readAll(file);
+  } catch (const std::bad_alloc&) {
+    return {};
+  }
 }
 
 }  // namespace

@@ -27,6 +27,7 @@ struct SlowFile {
   bool isWaitedFor = false;  // guarded by the mutex of all readings
 };
 
+/// What came of reading such a file.
 struct SlowText {
   std::optional<std::string> text = {};
   bool isGone = false;  // there is no device, or it has no such figure, rather than no answer

@@ -246,11 +246,15 @@ TEST_F(LoadTest, SetsAsideWhatItRefuses) {
                       {"bad.log.reason", "in/bad.log: is not a property list\n"},
                       {"empty.log.reason", "in/sub/empty.log: is empty\n"}}));
   EXPECT_EQ(contentOf(at("in/bad.log")), "nonsense");
-  const Outcome itself = run({at("in/z/aside"), "--set-aside", at("in/sub/loop/z/aside")});
-  EXPECT_EQ(
-      itself.error,
-      "tavrel-fleet: --set-aside: in/sub/loop/z/aside is loaded itself: name another folder\n");
-  EXPECT_EQ(itself.status, 2);
+  write("in/z/aside/a.log", "nonsense");
+  for (const char* const path : {"in/z/aside", "in/z/aside/a.log"}) {
+    const Outcome itself = run({at(path), "--set-aside", at("in/sub/loop/z/aside")});
+    EXPECT_EQ(
+        itself.error,
+        "tavrel-fleet: --set-aside: in/sub/loop/z/aside is loaded itself: name another folder\n");
+    EXPECT_EQ(itself.status, 2);
+  }
+  EXPECT_EQ(run({at("in/sub"), "--set-aside", at("in")}).status, 1);
 }
 
 TEST_F(LoadTest, LoadsNothingWhenAPathIsWrong) {
