@@ -3,6 +3,7 @@
 
 #include <algorithm>
 #include <chrono>
+#include <csignal>
 #include <cstdint>
 #include <filesystem>
 #include <fstream>
@@ -49,6 +50,24 @@ inline std::string xmlOf(std::string_view json) {
   EXPECT_TRUE(value) << value.error().message;
   return *plist::writeXml(*value);
 }
+
+/// A blocked signal that has arrived and waits, until a command takes it.
+class PendingSignal {
+ public:
+  explicit PendingSignal(int signal) {
+    sigset_t set;
+    sigemptyset(&set);
+    sigaddset(&set, signal);
+    pthread_sigmask(SIG_BLOCK, &set, &before_);
+    raise(signal);
+  }
+  ~PendingSignal() { pthread_sigmask(SIG_SETMASK, &before_, nullptr); }
+  PendingSignal(const PendingSignal&) = delete;
+  PendingSignal& operator=(const PendingSignal&) = delete;
+
+ private:
+  sigset_t before_;
+};
 
 /// Counts how often a file is opened.
 class Openings {

@@ -568,15 +568,10 @@ TEST(MachineSources, LeaveOutWhatCannotBe) {
 }
 
 TEST_F(StatCommands, CollectEndsEarlyBySignalAndKeepsItsSamples) {
-  sigset_t term, before;
-  sigemptyset(&term);
-  sigaddset(&term, SIGTERM);
-  pthread_sigmask(SIG_BLOCK, &term, &before);
-  raise(SIGTERM);
+  const PendingSignal term(SIGTERM);
   device.check("stat collect --seconds 3600",
                (Outcome{0, "kept 1 sample of this machine, taken over 0 seconds\n",
                         "tavrelctl: ended by a signal before 3600 seconds were over\n"}));
-  pthread_sigmask(SIG_SETMASK, &before, nullptr);
   EXPECT_TRUE(device.run("stat export com.norvane.usage.samples").out.ends_with("samples\t1\n"));
 }
 

@@ -325,6 +325,14 @@ TEST(LiveTest, RecordsWhatIsLive) {
   other.write(kZone + "thermal_zone1/temp", "9\n");  // it had no value when it was recorded
   EXPECT_EQ(other.run("report sample").out, live.out);
   EXPECT_EQ(device.run("registry list").out, other.run("registry list").out);
+
+  {
+    const PendingSignal term(SIGTERM);
+    device.check("registry record --live --seconds 3600 " + file,
+                 {0, "", "tavrelctl: ended by a signal before 3600 seconds were over\n"});
+  }
+  other.write("/var/lib/tavrel/registry/live.plist", contentOf(file));
+  EXPECT_EQ(other.run("report sample").out, live.out);
   device.check("registry record --seconds 1 -",
                fails("--seconds is for --live: recordings are written as they are", 2));
 }

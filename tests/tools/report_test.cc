@@ -2,6 +2,7 @@
 #include "device.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/coding.h"
+#include "tools/report/playback.h"
 
 namespace tavrel {
 namespace {
@@ -154,7 +155,7 @@ TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
              "18446744073709551615  entered 18446744073709551615\n"));
   const auto json = device.json("report sample --delta --interval 0");
   EXPECT_EQ(json["channels"][0]["states"], R"([{"id": 1, "name": null, "in_transitions": -6,
-      "residency": -6, "converted": null, "duty_cycle": 1.0, "current": false}])"_json);
+      "residency": -6, "converted": null, "duty_cycle": null, "current": false}])"_json);
 }
 
 TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
@@ -171,6 +172,52 @@ TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
                 "tavrelctl: 1 channel left out, as the change is unknown; the first is "
                 "flash0 <id 0x100000201> NAND Traffic Host reads: a value is not set, or the "
                 "number of values changed\n"});
+
+  // A channel without an earlier value has no change, and changes that of no other.
+  Array updates = Array::create();
+  updates.append(plist::Data(ByteSpan()));
+  for (const std::uint64_t count : {7U, 9U})
+    updates.append(element({0x100000201, 0x486F73745264, 0x100000001, 0, count}));
+  recorded.dictionary("Hub").array("Channels").at(0).dictionary().set("Elements", updates);
+  play(recorded);
+  const std::string writes =
+      "flash0 <id 0x100000201>\n  NAND\n    Traffic\n      Host writes  1.0 MiB\n";
+  const Outcome changes =
+      device.run("report sample --group NAND --delta --interval 0 --unit 4KiB --count 2");
+  EXPECT_EQ(changes.error,
+            "tavrelctl: 1 channel without values: the recording has none here, or the hub does not "
+            "know them\ntavrelctl: all channels have values again\ntavrelctl: 1 channel left out, "
+            "as the change is "
+            "unknown; the first is flash0 <id 0x100000201> NAND Traffic Host reads: the previous "
+            "sample has no value of it\n");
+  EXPECT_EQ(changes.out, "Change 1 of 2\n" + writes +
+                             "\nChange 2 of 2\nflash0 <id 0x100000201>\n  NAND\n    Traffic\n"
+                             "      Host reads   8.0 KiB\n      Host writes  0 bytes\n");
+}
+
+TEST_F(ReportTest, APlaybackFillsADocumentButNotMore) {
+  constexpr std::size_t kBytes = 100'000;
+  Playback playback(kBytes);
+  const auto channel = [](std::int64_t id) {
+    return Dictionary{{"DriverID", 7},
+                      {"LegendChannel", Array{id, 0x100000001}},
+                      {"RawElements", element({1, 2, 3, 4, 5})}};
+  };
+  // A channel that comes later was absent before.
+  while (playback.samples() < 200)
+    ASSERT_TRUE(playback.add({channel(1)}));
+  while (playback.add({channel(1), channel(2)})) {
+  }
+  const std::size_t samples = playback.samples();
+  const Array channels = playback.channels();
+  for (std::size_t i = 0; i < 2; ++i)
+    EXPECT_EQ(channels.at(i).dictionary().array("Elements").size(), samples);
+  EXPECT_EQ(channels.at(1).dictionary().array("Elements").at(199).data().size(), 0);
+  EXPECT_EQ(channels.at(1).dictionary().array("Elements").at(200).data().size(), 64);
+  const std::string document =
+      *plist::writeXml(Dictionary{{"Hub", Dictionary{{"Channels", channels}}}});
+  EXPECT_LE(document.size(), kBytes);
+  EXPECT_GT(document.size(), kBytes / 2);
 }
 
 TEST_F(ReportTest, DescribesInTheSystemsWords) {
@@ -204,7 +251,8 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
       {refusing, "describe", 1,
        subscribe + ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
                    "registry list' shows the drivers and the hub"},
-      {forgetful, "sample", 0, "1 channel without values: the hub does not know them"},
+      {forgetful, "sample", 0,
+       "1 channel without values: the recording has none here, or the hub does not know them"},
       {badLegend, "list", 0,
        "radio0 <id 0x100000202>: bad legend\ntavrelctl: these drivers are left out: 'tavrelctl "
        "registry show ID' shows what they publish"},

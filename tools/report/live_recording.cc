@@ -1,16 +1,18 @@
 #include "tools/report/live_recording.h"
 
+#include <algorithm>
 #include <chrono>
-#include <map>
-#include <thread>
-#include <utility>
 
-#include "ioreport/ioreport.h"
-#include "ioreport/keys.h"
+#include "base/format.h"
+#include "base/limits.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording.h"
+#include "platform/plist/xml.h"
+#include "tools/report/playback.h"
 #include "tools/report/report_sampler.h"
+#include "tools/shared/end_signals.h"
+#include "tools/shared/table.h"
 
 namespace tavrel {
 
@@ -19,33 +21,34 @@ plist::Dictionary recordLive(ToolContext& context, std::uint32_t seconds) {
   selection.live = true;
   Sampler sampler(context, selection);
   if (!sampler) return {};
-  using Key = std::pair<std::int64_t, std::int64_t>;  // driver and channel
-  std::map<Key, plist::Array> sequences;
+  const plist::Array services = context.linuxPlatform().registry().liveServices();
+  const auto servicesText = plist::writeXml(services);
+  if (!servicesText) {
+    context.fail(format("cannot record the live services: %s",
+                        std::string_view(servicesText.error().message)));
+    return {};
+  }
+  // Indented twice in the document.
+  Playback playback(limits::kPropertyListBytes -
+                    std::min(limits::kPropertyListBytes, 2 * servicesText->size()));
+  EndSignals signals;
   const auto begun = std::chrono::steady_clock::now();
-  for (std::uint32_t second = 0; second <= seconds; ++second) {
-    std::this_thread::sleep_until(begun + std::chrono::seconds(second));
+  for (std::uint32_t second = 0;;) {
     const plist::Dictionary samples = sampler.sample();
     if (!samples) return {};
-    for (const plist::Dictionary& channel : channelsIn(samples)) {
-      plist::Array& groups =
-          sequences[{IOReportChannelGetDriverID(channel), IOReportChannelGetChannelID(channel)}];
-      // Empty data stands for the samples in which the channel was absent.
-      while (groups.size() < second)
-        groups.append(plist::Data(ByteSpan()));
-      groups.append(channel.data(kRawElementsKey));
+    if (!playback.add(channelsIn(samples))) {
+      context.note(format("ended after %s: a recording has at most %zu MiB",
+                          counted(playback.samples(), "sample"), limits::kPropertyListBytes >> 20));
+      break;
+    }
+    if (second == seconds) break;
+    if (signals.arriveBefore(begun + std::chrono::seconds(++second))) {
+      context.note(format("ended by a signal before %u seconds were over", seconds));
+      break;
     }
   }
-  plist::Array channels = plist::Array::create(sequences.size());
-  for (auto& [key, groups] : sequences) {
-    while (groups.size() <= seconds)
-      groups.append(plist::Data(ByteSpan()));
-    channels.append(
-        plist::Dictionary{{"DriverID", key.first},
-                          {"ChannelID", key.second},
-                          {"Elements", groups.size() == 1 ? groups.at(0) : plist::Value(groups)}});
-  }
-  return {{"Services", context.linuxPlatform().registry().liveServices()},
-          {"Hub", plist::Dictionary{{"EntryID", kLiveHubID}, {"Channels", channels}}}};
+  return {{"Services", services},
+          {"Hub", plist::Dictionary{{"EntryID", kLiveHubID}, {"Channels", playback.channels()}}}};
 }
 
 }  // namespace tavrel

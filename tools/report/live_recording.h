@@ -9,8 +9,9 @@
 namespace tavrel {
 
 /// All live services with their channels' elements: one sample now and one more each second for
-/// `seconds` seconds, which a hub plays back in order. Channels without a value in any sample are
-/// published but unknown to their hub. Returns an empty handle after a message that says why.
+/// `seconds` seconds, which a hub plays back in order. SIGINT, SIGTERM or a full document end it
+/// early, with a note. Channels without a value in any sample are published but unknown to their
+/// hub. Returns an empty handle after a message that says why.
 plist::Dictionary recordLive(ToolContext& context, std::uint32_t seconds);
 
 }  // namespace tavrel

@@ -76,9 +76,7 @@ class Changes {
   explicit Changes(ToolContext& context) : context_(context) {}
 
   plist::Dictionary between(const plist::Dictionary& previous, const plist::Dictionary& current) {
-    PartialDelta delta;
-    delta.samples = IOReportCreateSamplesDelta(previous, current, nullptr);
-    if (!delta.samples) delta = subtractEach(previous, current);
+    const SampleChanges delta = changesBetween(previous, current);
     if (delta.leftOut != std::exchange(leftOut_, delta.leftOut) && delta.leftOut > 0) {
       context_.note(format("%s left out, as the change is unknown; the first is %s",
                            counted(delta.leftOut, "channel"), delta.firstLeftOut));
@@ -104,9 +102,10 @@ void sample(ToolContext& context, const Arguments& arguments) {
     if (!samples) return;
     const std::int32_t missing = sampler.missing(samples);
     if (missing != reported) {
-      context.note(format("%s without values: %s",
-                          counted(static_cast<std::uint64_t>(missing), "channel"),
-                          sampler.reasonForMissing()));
+      context.note(missing == 0 ? "all channels have values again"
+                                : format("%s without values: %s",
+                                         counted(static_cast<std::uint64_t>(missing), "channel"),
+                                         sampler.reasonForMissing()));
       reported = missing;
     }
     const plist::Dictionary shown = previous ? changes.between(previous, samples) : samples;

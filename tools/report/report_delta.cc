@@ -33,25 +33,24 @@ std::string placeOf(const plist::Dictionary& channel) {
 
 }  // namespace
 
-PartialDelta subtractEach(const plist::Dictionary& previous, const plist::Dictionary& current) {
+SampleChanges changesBetween(const plist::Dictionary& previous, const plist::Dictionary& current) {
   std::map<Identity, plist::Dictionary> earlier;
   for (const plist::Dictionary& channel : channelsIn(previous))
     earlier.emplace(identityOf(channel), channel);
 
   const std::int32_t options = _getAggregateOpts(current);
-  PartialDelta delta;
+  SampleChanges delta;
   delta.samples = IOReportCreateAggregate(options);
   for (const plist::Dictionary& channel : channelsIn(current)) {
     std::optional<ErrorObject> error;
-    const auto before = earlier.find(identityOf(channel));
-    const plist::Dictionary change =
-        before == earlier.end() ? channel
-                                : IOReportSampleCreateDelta(before->second, channel, &error);
-    if (change && _addChannel(delta.samples, change, options, &error) == kKernelSuccess) continue;
+    std::string reason = "the previous sample has no value of it";
+    if (const auto before = earlier.find(identityOf(channel)); before != earlier.end()) {
+      const auto change = IOReportSampleCreateDelta(before->second, channel, &error);
+      if (change && _addChannel(delta.samples, change, options, &error) == kKernelSuccess) continue;
+      reason = reasonOf(error).value_or("a value is not set, or the number of values changed");
+    }
     if (delta.leftOut++ > 0) continue;
-    delta.firstLeftOut =
-        format("%s: %s", placeOf(channel),
-               reasonOf(error).value_or("a value is not set, or the number of values changed"));
+    delta.firstLeftOut = format("%s: %s", placeOf(channel), reason);
   }
   return delta;
 }

@@ -8,15 +8,16 @@
 
 namespace tavrel {
 
-/// A delta without the channels that could not be subtracted.
-struct PartialDelta {
+/// The changes of the channels that could be subtracted.
+struct SampleChanges {
   plist::Dictionary samples;
   std::size_t leftOut = 0;
   std::string firstLeftOut;  // "DRIVER GROUP SUBGROUP NAME: REASON"
 };
 
-/// For samples whose delta cannot be computed as a whole. A channel that has no
-/// earlier sample keeps its values.
-PartialDelta subtractEach(const plist::Dictionary& previous, const plist::Dictionary& current);
+/// Pairs channels by their identity. The system's own delta pairs them by position, and takes
+/// values since boot for the change of each channel for which it finds no earlier one: when one was
+/// absent before, of all that follow it.
+SampleChanges changesBetween(const plist::Dictionary& previous, const plist::Dictionary& current);
 
 }  // namespace tavrel

@@ -66,7 +66,7 @@ void writeStates(JsonWriter& json, const plist::Dictionary& channel, bool isDelt
   const std::int32_t count = IOReportStateGetCount(channel);
   const Elements elements = elementsOfType(channel, kFormatState);
   const plist::Array names = stateNames(channel);
-  const std::uint64_t total = totalResidency(elements);
+  const std::uint64_t total = residencyToShare(elements, isDelta);
   for (std::int32_t state = 0; state < count; ++state) {
     const auto i = static_cast<std::size_t>(state);
     const double duty = dutyCycle(elements, i, total);

@@ -49,6 +49,12 @@ std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, s
   return std::nullopt;
 }
 
+std::uint64_t residencyToShare(const Elements& states, bool isDelta) {
+  for (std::size_t i = 0; isDelta && i < states.count(); ++i)
+    if (states.value(i, kStateResidency) < 0) return 0;
+  return totalResidency(states);
+}
+
 std::string textOf(const ConvertedValue& converted) {
   return converted.unit == kBytes ? sizeText(converted.value)
                                   : quantityText(converted.value, converted.unit);

@@ -7,6 +7,7 @@
 #include <string_view>
 
 #include "base/plist.h"
+#include "ioreport/elements.h"
 
 namespace tavrel {
 
@@ -19,6 +20,10 @@ struct ConvertedValue {
 /// Converts `value` from its channel's unit. Nothing for counts, and for units
 /// that cannot be converted.
 std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, std::int64_t value);
+
+/// The time of which each state has its share. 0, which gives no state a share, when a change has a
+/// state that lasted less than nothing: its counter started over.
+std::uint64_t residencyToShare(const Elements& states, bool isDelta);
 
 /// "309.7 GiB", "41.3 °C", "12.5 ms".
 std::string textOf(const ConvertedValue& converted);

@@ -42,7 +42,7 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
   return channels;
 }
 
-Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
+Sampler::Sampler(ToolContext& context, const ReportSelection& selection, NoChannels noChannels)
     : context_(context), noting_(context) {
   const auto selected = selectedChannels(context, noting_, selection);
   if (!selected) {
@@ -50,6 +50,7 @@ Sampler::Sampler(ToolContext& context, const ReportSelection& selection)
     return;
   }
   if (IOReportGetChannelCount(*selected) == 0) {
+    if (noChannels == NoChannels::AreFine) return;
     context.fail(whyNoChannels(context.root(), selection));
     return;
   }
@@ -79,7 +80,7 @@ std::int32_t Sampler::missing(const plist::Dictionary& samples) const {
 const char* Sampler::reasonForMissing() const {
   const bool isAnyLive = !context_.linuxPlatform().registry().liveServices().empty();
   return isAnyLive ? "their devices do not report them now, or the hub does not know them"
-                   : "the hub does not know them";
+                   : "the recording has none here, or the hub does not know them";
 }
 
 }  // namespace tavrel

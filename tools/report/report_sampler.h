@@ -19,8 +19,11 @@ Expected<plist::Dictionary> selectedChannels(ToolContext& context, NotingPlatfor
 
 class Sampler {
  public:
+  enum class NoChannels { AreAFailure, AreFine };
+
   /// Prints what is wrong when it cannot subscribe.
-  Sampler(ToolContext& context, const ReportSelection& selection);
+  Sampler(ToolContext& context, const ReportSelection& selection,
+          NoChannels noChannels = NoChannels::AreAFailure);
 
   explicit operator bool() const { return subscription_ != nullptr; }
 

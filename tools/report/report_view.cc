@@ -155,7 +155,7 @@ class SamplePrinter {
     const std::int32_t current = IOReportStateGetCurrent(channel);
     const Elements states = elementsOfType(channel, kFormatState);
     const plist::Array names = stateNames(channel);
-    const std::uint64_t total = totalResidency(states);
+    const std::uint64_t total = residencyToShare(states, isDelta_);
     for (std::size_t i = 0; i < states.count(); ++i) {
       const auto name = names.at(i).string();
       const double duty = dutyCycle(states, i, total);

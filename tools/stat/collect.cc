@@ -1,15 +1,14 @@
 #include "tools/stat/collect.h"
 
 #include <algorithm>
-#include <cerrno>
 #include <chrono>
-#include <csignal>
 #include <ostream>
 #include <string>
 
 #include "base/format.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/segment_folder.h"
+#include "tools/shared/end_signals.h"
 #include "tools/shared/table.h"
 #include "tools/stat/collector.h"
 #include "tools/stat/single_readings.h"
@@ -24,41 +23,13 @@ using Ticks = CollectPace::Ticks;
 // Only the latest number of processes is kept, so most readings leave it out.
 constexpr std::uint64_t kSecondsPerCount = 60;
 
-// Blocks SIGINT and SIGTERM during its lifetime, so that sampled values are kept when they arrive.
-class EndSignals final : public CollectPace {
+class UntilSignal final : public CollectPace {
  public:
-  EndSignals() {
-    sigemptyset(&signals_);
-    sigaddset(&signals_, SIGINT);
-    sigaddset(&signals_, SIGTERM);
-    pthread_sigmask(SIG_BLOCK, &signals_, &before_);
-  }
-  ~EndSignals() override {
-    // Discard signals that arrived since: they asked for the end that this is.
-    while (waitForOne(Ticks())) {
-    }
-    pthread_sigmask(SIG_SETMASK, &before_, nullptr);
-  }
-  EndSignals(const EndSignals&) = delete;
-  EndSignals& operator=(const EndSignals&) = delete;
-
   Ticks now() override { return std::chrono::steady_clock::now(); }
-  bool endsBefore(Ticks end) override { return waitForOne(end); }
+  bool endsBefore(Ticks end) override { return signals_.arriveBefore(end); }
 
  private:
-  bool waitForOne(Ticks end) const {
-    for (;;) {
-      const auto left = std::max(end - std::chrono::steady_clock::now(), Ticks::duration::zero());
-      const auto seconds = std::chrono::floor<std::chrono::seconds>(left);
-      const auto rest = std::chrono::nanoseconds(left - seconds).count();
-      const timespec wait{.tv_sec = seconds.count(), .tv_nsec = static_cast<long>(rest)};
-      if (sigtimedwait(&signals_, nullptr, &wait) > 0) return true;
-      if (errno != EINTR) return false;
-    }
-  }
-
-  sigset_t signals_;
-  sigset_t before_;
+  EndSignals signals_;  // sampled values are kept when one arrives
 };
 
 }  // namespace
@@ -97,7 +68,7 @@ void collectStatistics(ToolContext& context, std::uint32_t seconds, CollectPace&
 }
 
 void collectStatistics(ToolContext& context, std::uint32_t seconds) {
-  EndSignals signals;
+  UntilSignal signals;
   collectStatistics(context, seconds, signals);
 }
 
@@ -144,7 +115,7 @@ void collectEvery(ToolContext& context, std::chrono::seconds period, const std::
 }
 
 void collectEvery(ToolContext& context, std::chrono::seconds period, const std::string& stateFile) {
-  EndSignals signals;
+  UntilSignal signals;
   collectEvery(context, period, stateFile, signals);
 }
 
