@@ -1,5 +1,8 @@
 // tavrelctl export openmetrics
+#include "base/bytes.h"
 #include "device.h"
+#include "ioreport/elements.h"
+#include "platform/plist/coding.h"
 #include "tools/export/metric_page.h"
 
 namespace tavrel {
@@ -113,10 +116,13 @@ TEST(ExportTest, IsAcceptedByBothParsers) {
             "tavrel_disk_figure_bytes{disk=\"nvme0\",figure=\"written\"} 512\n"
             "tavrel_disk_figure_bytes{disk=\"nvme0\",figure=\"written_growth\"} 5\n"
             "tavrel_disk_figure_celsius{disk=\"nvme0\",figure=\"temperature\"} 41.5\n");
-  expectIn(page,
-           {"\ntavrel_channel_values{driver=\"flash0 <id 0x100000201>\",group=\"NAND\","
-            "subgroup=\"Latency\",channel=\"Read latency\",up_to=\"+Inf\",unit=\"seconds\"} 750\n",
-            "tavrel_check_state{check=\"queue\",subject=\"pending\"} 0\n"});
+  expectIn(page, {"\ntavrel_channel_distribution_seconds_sum{driver=\"flash0 <id "
+                  "0x100000201>\",group=\"NAND\","
+                  "subgroup=\"Latency\",channel=\"Read latency\"} 0.02613\n"
+                  "tavrel_channel_distribution_seconds_count{driver=\"flash0 <id "
+                  "0x100000201>\",group=\"NAND\","
+                  "subgroup=\"Latency\",channel=\"Read latency\"} 750\n",
+                  "tavrel_check_state{check=\"queue\",subject=\"pending\"} 0\n"});
   EXPECT_EQ(linesWith(page, "tavrel_metrics_left_out"), "tavrel_metrics_left_out 0\n");
   EXPECT_EQ(linesWith(device.run("export openmetrics --day yesterday").out, "tavrel_scalar"),
             "tavrel_scalar{key=\"com.example.y\"} 1\n");
@@ -134,6 +140,21 @@ TEST(ExportTest, IsAcceptedByBothParsers) {
   if (openMetrics < 0) GTEST_SKIP() << "install python3-prometheus-client to check the format";
   if (prometheus < 0) GTEST_SKIP() << "script/promtool build/promtool fetches promtool";
   EXPECT_EQ(contentOf(errors + "2"), "");
+}
+
+TEST(ExportTest, AHistogramWithoutASumIsAGauge) {
+  const TemporaryDevice device;
+  const auto recording =
+      plist::read(asBytes(contentOf(TAVREL_EXAMPLES "/registry/report.plist")))->dictionary();
+  plist::Dictionary channel = recording.dictionary("Hub").array("Channels").at(2).dictionary();
+  const ByteSpan recorded = channel.array("Elements").at(0).data().bytes();
+  std::vector<std::byte> bytes(recorded.begin(), recorded.end());
+  storeLittle64(bytes, 3 * kElementBytes + 56, std::uint64_t{1} << 63);  // of a bucket with values
+  channel.set("Elements", plist::Data(bytes));
+  device.write("/var/lib/tavrel/registry/a.plist", *plist::writeXml(recording));
+  expectIn(device.run("export openmetrics").out,
+           {"\ntavrel_channel_values{driver=\"flash0 <id 0x100000201>\",group=\"NAND\",subgroup="
+            "\"Latency\",channel=\"Read latency\",up_to=\"+Inf\",unit=\"seconds\"} 750\n"});
 }
 
 }  // namespace

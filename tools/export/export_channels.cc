@@ -124,7 +124,8 @@ class ChannelExport {
       const auto bound = inUnit(upper);
       if (!bound || __builtin_add_overflow(hits, static_cast<std::uint64_t>(more), &hits)) return;
       if (!point.buckets.empty() && *bound <= point.buckets.back().first) return;
-      const auto part = inUnit(IOReportHistogramGetBucketSum(channel_, bucket));
+      // The sum of a bucket is unset until it has a value.
+      const auto part = more == 0 ? 0.0 : inUnit(IOReportHistogramGetBucketSum(channel_, bucket));
       isSumKnown = isSumKnown && part && *part >= 0 && lower >= 0;
       sum += part.value_or(0);
       point.buckets.emplace_back(*bound, hits);
@@ -166,12 +167,7 @@ class ChannelExport {
 
 void exportChannels(ToolContext& context, MetricPage& page) {
   // A device without drivers has no channels, which is not a fault.
-  {
-    NotingPlatform noting(context);
-    const auto published = selectChannels(noting.platform(), {});
-    if (!published || IOReportGetChannelCount(*published) == 0) return;
-  }
-  Sampler sampler(context, {});
+  Sampler sampler(context, {}, Sampler::NoChannels::AreFine);
   if (!sampler) return;
   const plist::Dictionary samples = sampler.sample();
   if (!samples) return;

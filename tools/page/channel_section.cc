@@ -26,12 +26,7 @@ std::string_view textOr(std::optional<std::string_view> text) {
 std::vector<plist::Dictionary> sampledStates(ToolContext& context) {
   ReportSelection states;
   states.format = "state";
-  {
-    NotingPlatform noting(context);
-    const auto published = selectChannels(noting.platform(), states);
-    if (!published || IOReportGetChannelCount(*published) == 0) return {};
-  }
-  Sampler sampler(context, states);
+  Sampler sampler(context, states, Sampler::NoChannels::AreFine);
   if (!sampler) return {};
   const plist::Dictionary samples = sampler.sample();
   return samples ? channelsIn(samples) : std::vector<plist::Dictionary>();
