@@ -164,8 +164,9 @@ TEST(Rehearse, TellsEveryStepAndChangesNothing) {
   EXPECT_EQ(device.files(), before);
 
   const std::string verbose = device.text(" --today -v");
-  expectIn(verbose, {"\n    |     <key>app.starts</key>\n", "\n    | Hardware Model: Board\n",
-                     "\n  would file record of type 176: {\"Factory Count\": 7}\n"});
+  expectIn(verbose,
+           {"\n    |     <key>app.starts</key>\n", "\n    | Hardware Model: Board\n",
+            " +0000 tavrel[", "\n  would file record of type 176: {\"Factory Count\": 7}\n"});
 }
 
 TEST(Rehearse, GatedRunStopsWhereItsDayIsDone) {

@@ -36,6 +36,17 @@ class ReadOnlyFileSystem final : public FileSystem {
   }
 };
 
+// The NAND log names the program that writes it.
+class DaemonProcess final : public Process {
+ public:
+  explicit DaemonProcess(Process& below) : below_(below) {}
+  std::string name() override { return "tavrel"; }
+  std::int32_t identifier() override { return below_.identifier(); }
+
+ private:
+  Process& below_;
+};
+
 }  // namespace
 
 // Gives the services below a platform of their own, so that their messages go to the overlay, too.
@@ -49,6 +60,7 @@ struct OverlayPlatform::Services {
     platform.files = files;
     platform.locale = locale;
     platform.notifications = notifications;
+    platform.process = process;
     platform.standardStreams = streams;
     platform.statistics = store;
     platform.submission = submission;
@@ -77,6 +89,7 @@ struct OverlayPlatform::Services {
   OverlayFileReader files{platform.files, events};
   OverlayLocale locale{platform.locale, events};
   OverlayNotifications notifications{events};
+  DaemonProcess process{platform.process};
   OverlayStreams streams{events};
   OverlayStore store{platform.statistics, events};
   OverlaySubmission submission{below.submission(), events};
