@@ -29,7 +29,10 @@ TEST_F(WhitelistCheck, PointsAtEverythingThatTheDaemonWouldNotUse) {
       "DistributionKeyPrefixes": {"e.": {}},
       "ScalarKeys": {"both": {"sig_fig": 1}, "mask": {"bucket_interval": 1}}},
     "C": {"ScalarKeys": {"both": {"sig_fig": 1}}, "ScalarKeyPrefixes": {"p.": {"sig_fig": 1}}},
-    "D": true})"));
+    "D": true,
+    "InternalTesting": {"ScalarKeys": {"both": {}, "late": {}},
+                        "ScalarKeyPrefixes": {"": {}, "p.q.r.s": {}}},
+    "Z": {"ScalarKeys": {"late": {"sig_fig": 1}}}})"));
   const std::string expected =
       R"(A/DistributionKeys: is an array: a table is a dictionary from keys to options: ignored
 A/ScalarKeys/both: is let out unchanged: coarsen it, or say with a bucket_interval of 1 that this is intended
@@ -56,6 +59,7 @@ B/ScalarKeyPrefixes/p.: is let out unchanged: coarsen it, or say with a bucket_i
 D: is a boolean: a group is a dictionary of tables: ignored
 A/ScalarKeys/both: is also listed by group C, which comes later and wins
 B/ScalarKeys/both: is also listed by group C, which comes later and wins
+InternalTesting/ScalarKeys/late: is also listed by group Z, which comes later and wins
 B/ScalarKeyPrefixes/p.: is also listed by group C, which comes later and wins
 B/ScalarKeyPrefixes/: is hidden by the longer prefix B/ScalarKeyPrefixes/p. for keys that begin with that
 C/ScalarKeyPrefixes/p.: is hidden by the longer prefix B/ScalarKeyPrefixes/p.q. for keys that begin with that

@@ -12,6 +12,7 @@
 #include "tools/shared/value_text.h"
 #include "tools/whitelist/whitelist_coarseness.h"
 #include "tools/whitelist/whitelist_model.h"
+#include "tools/whitelist/whitelist_rules.h"
 
 namespace tavrel {
 namespace {
@@ -69,7 +70,7 @@ class Checker {
     for (const plist::Entry& group : whitelist.dictionary()) {
       const Place place(*this, group.key);
       // Statistics that leave only internal devices are meant to be exact.
-      isForAll_ = group.key != kInternalTestingGroup;
+      isForAll_ = isLoadedByDefault(group.key);
       checkGroup(group.value);
     }
   }
@@ -123,7 +124,7 @@ class Checker {
                    kindWithArticle(rule.value)));
         continue;
       }
-      if (isPrefixTable(table) && rule.key.view().empty()) {
+      if (isForAll_ && isPrefixTable(table) && rule.key.view().empty()) {
         add("is the empty prefix: every key begins with it");
       }
       if (isForAll_ && !isDistributionTable(table) && coarsensNoScalar(rule.value.dictionary())) {
@@ -217,24 +218,29 @@ class Checker {
   Findings& findings_;
 };
 
+// Devices that are not internal do not load a later group for internal devices, so the entry still
+// counts there.
 void findRivals(const std::vector<WhitelistRule>& rules, Findings& findings) {
-  std::unordered_map<std::string_view, std::string_view> winners;
-  for (const WhitelistRule& rule : rules)
-    winners[rule.key] = rule.group;
+  std::unordered_map<std::string_view, const WhitelistRule*> winners;
   for (const WhitelistRule& rule : rules) {
-    const std::string_view winner = winners[rule.key];
-    if (winner == rule.group) continue;
+    if (isLoadedByDefault(rule.group)) winners[rule.key] = &rule;
+  }
+  for (const WhitelistRule& rule : rules) {
+    const auto winner = winners.find(rule.key);
+    if (winner == winners.end() || winner->second <= &rule) continue;
     findings.add(pathOfRule(rule), format("is also listed by group %s, which comes later and wins",
-                                          shownName(winner)));
+                                          shownName(winner->second->group)));
   }
 }
 
-// When sorted, a prefix directly follows those that it begins with; the stack holds these.
+// When sorted, a prefix directly follows those that it begins with; the stack holds these. Groups
+// for internal devices are left out: on other devices their prefixes hide nothing.
 void findHiddenPrefixes(const std::vector<WhitelistRule>& rules, Findings& findings) {
   std::vector<const WhitelistRule*> sorted;
   sorted.reserve(rules.size());
-  for (const WhitelistRule& rule : rules)
-    sorted.push_back(&rule);
+  for (const WhitelistRule& rule : rules) {
+    if (isLoadedByDefault(rule.group)) sorted.push_back(&rule);
+  }
   std::stable_sort(sorted.begin(), sorted.end(),
                    [](const auto* a, const auto* b) { return a->key < b->key; });
   std::vector<const WhitelistRule*> enclosing;
