@@ -110,7 +110,9 @@ TEST_F(Consent, ASwitchSetByHandLosesTheDay) {
   device.check("allow", prints("submission is already allowed\n"));
   for (const auto& [key, value, wrong, right] :
        {std::array{kSwitch.c_str(), "yes", "a boolean, not \"yes\"", ""},
-        {"com.norvane.NANDInfo userWAmp", "10 --int", "a number above 0 and below 10, not 10",
+        {"com.norvane.NANDInfo userWAmp", "3 --int", "a real above 0 and below 10, not 3",
+         "2.5 --float"},
+        {"com.norvane.NANDInfo userWAmp", "10 --float", "a real above 0 and below 10, not 10.0",
          "2.5 --float"},
         {"com.norvane.da Radio", "no", "a boolean, not \"no\"", "true|false --bool"},
         {"com.norvane.zentrix com.norvane.x", "1 --int", "a boolean, not 1", "true|false --bool"},

@@ -28,7 +28,7 @@ bool isCount(const plist::Value& value) {
 
 bool isAmplification(const plist::Value& value) {
   const auto number = value.number();
-  return number && number->real() > 0 && number->real() < 10;
+  return number && number->isFloating() && number->real() > 0 && number->real() < 10;
 }
 
 constexpr Form kBoolean{"a boolean", "true|false --bool",
@@ -47,7 +47,7 @@ constexpr Form kDictionary{"a dictionary", "@FILE --plist", [](const plist::Valu
                            }};
 constexpr Form kArray{"an array", "@FILE --plist",
                       [](const plist::Value& value) { return static_cast<bool>(value.array()); }};
-constexpr Form kAmplification{"a number above 0 and below 10", "2.5 --float", isAmplification};
+constexpr Form kAmplification{"a real above 0 and below 10", "2.5 --float", isAmplification};
 
 struct KnownPreference {
   std::string_view domain;
