@@ -172,6 +172,14 @@ TEST_F(TaskingTest, RefusesWhatADeviceWouldNotApplyAsWritten) {
           "Key": "DiagnosticSubmissionFirstDay", "Value": 1}]})",
        {"TaskingPayload[0]: changes the permission to submit logs, which only the owner may: use "
         "'tavrelctl allow' or 'tavrelctl deny'"}},
+      {R"({"TaskingID": "t", "TaskingPayload": [
+          {"Domain": "com.norvane.da", "Key": "Usage", "Value": "false"},
+          {"Domain": "com.norvane.da", "Key": "AggressiveSubmissionDays", "Value": [3]}]})",
+       {"TaskingPayload[0]/Value: preference Usage of domain com.norvane.da is a boolean, not "
+        "\"false\"",
+        "TaskingPayload[1]/Value: preference AggressiveSubmissionDays of domain com.norvane.da is "
+        "an "
+        "integer of 0 to 2147483647, not an array"}},
       {R"({"TaskingID": "t", "TaskingPayload": [{"Domain": "d", "Key": "k", "Value": ["a\u0001"]}]})",
        {"TaskingPayload[0]: contains text that preferences cannot store: property lists contain no "
         "control characters and only UTF-8: give such bytes as data"}}};

@@ -79,22 +79,22 @@ constexpr std::array kKnown = {
 
 }  // namespace
 
-std::string faultOfPreference(std::string_view domain, std::string_view key,
-                              const plist::Value& value) {
+std::optional<PreferenceFault> faultOfPreference(std::string_view domain, std::string_view key,
+                                                 const plist::Value& value) {
   const auto* const known =
       std::find_if(kKnown.begin(), kKnown.end(), [&](const KnownPreference& entry) {
         return entry.domain == domain && (entry.key.empty() || entry.key == key);
       });
-  if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return {};
+  if (known == kKnown.end() || value.isNull() || known->form.fits(value)) return std::nullopt;
   const bool isLong = value.dictionary() || value.array() || value.data();
   // Give no example that would grant the permission when copied.
   const bool isPermission = known->key.starts_with("DiagnosticSubmission");
-  const std::string cure = isPermission ? std::string("use 'tavrelctl allow' or 'tavrelctl deny'")
-                                        : format("give 'tavrelctl prefs set %s %s %s'", domain, key,
-                                                 known->form.example);
-  return format("preference %s of domain %s is %s, not %s: %s, or store it anyway with --force",
-                key, domain, known->form.text, isLong ? kindWithArticle(value) : inlineText(value),
-                cure);
+  return PreferenceFault{
+      format("preference %s of domain %s is %s, not %s", key, domain, known->form.text,
+             isLong ? kindWithArticle(value) : inlineText(value)),
+      isPermission
+          ? "use 'tavrelctl allow' or 'tavrelctl deny'"
+          : format("give 'tavrelctl prefs set %s %s %s'", domain, key, known->form.example)};
 }
 
 }  // namespace tavrel

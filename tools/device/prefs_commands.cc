@@ -137,8 +137,11 @@ void set(ToolContext& context, const Arguments& arguments) {
   }
   const auto xml = plist::writeXml(*value);
   if (!xml) return context.failUsage(format("cannot be stored: %s", xml.error().message));
-  const std::string fault = faultOfPreference(arguments.domain, arguments.key, *value);
-  if (!fault.empty() && !arguments.force) return context.failUsage(fault);
+  const auto fault = faultOfPreference(arguments.domain, arguments.key, *value);
+  if (fault && !arguments.force) {
+    return context.failUsage(
+        format("%s: %s, or store it anyway with --force", fault->what, fault->cure));
+  }
   // Stores the value as it will be read back: dates, for example, lose their fraction.
   if (store(context, arguments, *plist::readXml(asBytes(*xml)))) {
     noteTextThatReadsOtherwise(context, arguments);

@@ -10,6 +10,7 @@
 
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
+#include "tools/device/known_preferences.h"
 #include "tools/shared/typed_value.h"
 #include "tools/shared/value_text.h"
 
@@ -107,6 +108,9 @@ std::vector<std::string> checkTasking(const plist::Value& tasking) {
       findings.add(path,
                    "changes the permission to submit logs, which only the owner may: use "
                    "'tavrelctl allow' or 'tavrelctl deny'");
+    } else if (domain && key) {
+      const auto fault = faultOfPreference(*domain, *key, setting.get("Value"));
+      if (fault) findings.add(path + "/Value", fault->what);
     }
     if (!setting.contains("Value")) findings.add(path + "/Value", "is missing");
     if (domain && key && !settings.emplace(*domain, *key).second) {

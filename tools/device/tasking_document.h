@@ -16,8 +16,8 @@
 
 namespace tavrel {
 
-/// The reasons why a device would not apply the tasking as written, one line each, such as
-/// "TaskingPayload[3]/Domain: is missing". Empty for a valid tasking.
+/// The reasons why a device would not apply the tasking as written, or would not read a setting,
+/// one line each, such as "TaskingPayload[3]/Domain: is missing". Empty for a valid tasking.
 std::vector<std::string> checkTasking(const plist::Value& tasking);
 
 }  // namespace tavrel
