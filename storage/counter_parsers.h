@@ -44,7 +44,8 @@ struct ManufacturerId {
 };
 
 /// Reads a controller's "manufacturer-id", up to 12 hexadecimal digits: 4 for the vendor, the rest
-/// for the device. Missing digits count as 0; other characters are reported on standard output.
+/// for the device. A shorter part is a smaller number, so an id without its last digits is another
+/// chip's. A character that is no digit counts as 0 and is reported on standard output.
 ManufacturerId readManufacturerId(StandardStreams& streams, std::string_view text);
 
 /// The generation takes precedence over the maker.
