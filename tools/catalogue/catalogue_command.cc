@@ -147,7 +147,7 @@ void addCatalogueCommand(Command app, ToolContext& context) {
   const auto arguments = std::make_shared<Arguments>();
   const Command command =
       app.addCommand("catalogue", "Show what statistics and report channels mean, and their units");
-  command.addOption("KEY", arguments->keys, "Keys, or names of channels (default: all)");
+  command.addOption("KEY", arguments->keys, "Keys, or names of channels (default: all)").notEmpty();
   context.addJsonOption(command);
   command.onRun([&context, arguments] {
     if (arguments->keys.empty()) {

@@ -92,7 +92,7 @@ void addShow(Command group, ToolContext& context) {
                  arguments, context, [](ToolContext& tool, const ShowArguments& given) {
                    showStatistic(tool, given.key, given.days);
                  });
-  shown.addOption("KEY", arguments->key, "Name of the statistic").required();
+  shown.addOption("KEY", arguments->key, "Name of the statistic").required().notEmpty();
   shown.addOption("--days", arguments->days, "Only the last N days, today included (default: all)")
       .typeName("N")
       .check([](const std::string& text) { return countFault(text, "days"); });

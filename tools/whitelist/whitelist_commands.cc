@@ -153,7 +153,7 @@ void addWhitelistCommands(Command app, ToolContext& context) {
 
   const Command explainCommand =
       group.addCommand("explain", "Show which rule applies to a key, and its options");
-  explainCommand.addOption("KEY", arguments->keys, "Keys of statistics").required();
+  explainCommand.addOption("KEY", arguments->keys, "Keys of statistics").required().notEmpty();
   explainCommand.addOption("--value", arguments->value, "Also show how this value is coarsened")
       .typeName("NUMBER");
   explainCommand
