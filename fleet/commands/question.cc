@@ -106,7 +106,7 @@ std::string Question::readVersion(std::string_view text) const {
   }
   if (found == nullptr && std::ranges::all_of(table_.texts(Attribute::Os), &std::string::empty)) {
     throw std::runtime_error(
-        "no log says its OS version: load the logs with their metadata, see docs/fleet-loading.md");
+        "no log says its OS version: load the logs with their metadata: see tavrel-fleet(1)");
   }
   if (found == nullptr) {
     throw std::runtime_error("version \"" + printable(text) + "\" " +

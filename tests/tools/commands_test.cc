@@ -263,7 +263,7 @@ TEST(LogPreview, ShowsTheLogOfARunAndChangesNothing) {
   // What each content of the whitelist's file is to a preview; empty for none.
   const std::pair<const char*, std::string> kFaults[] = {
       {"", "cannot read " + device.path(kWhitelistFile) +
-               ": No such file or directory: write a whitelist, as docs/whitelist.md describes it"},
+               ": No such file or directory: write a whitelist, as tavrel(8) describes it"},
       {"junk",
        device.path(kWhitelistFile) + noList + ": repair it, or replace it with another whitelist"}};
   const auto setWhitelist = [&](const std::string& content) {

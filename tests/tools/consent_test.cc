@@ -77,7 +77,7 @@ TEST_F(Consent, BeginsAfterAllThatIsRecorded) {
   fs::remove(device.path(kWhitelistFile));
   expectIn(device.run("allow --from today").error,
            {"tavrelctl: no log is made yet: cannot read " + device.path(kWhitelistFile) +
-            ": No such file or directory: write a whitelist, as docs/whitelist.md describes it\n"});
+            ": No such file or directory: write a whitelist, as tavrel(8) describes it\n"});
   device.run("deny");
   ASSERT_TRUE(KeptValues(device.path(kStore)).add({{0, today + 7, 1, "k"}}));
   EXPECT_EQ(device.json("allow")["submission_first_day"]["day"], today + 8);

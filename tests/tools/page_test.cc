@@ -38,8 +38,7 @@ TEST_F(PageTest, TellsOfADeviceThatHasNothing) {
                       "No drive of this device reports"});
   EXPECT_EQ(device.run("page -o -").error,
             "tavrelctl: cannot read " + device.path(kWhitelistFile) +
-                ": No such file or directory: write a whitelist, as docs/whitelist.md describes "
-                "it\n");
+                ": No such file or directory: write a whitelist, as tavrel(8) describes it\n");
   EXPECT_EQ(device.files(), TemporaryDevice().files());
 }
 

@@ -73,7 +73,7 @@ TEST_F(WhitelistCheck, SaysWhatKeepsTheFileFromBeingUsed) {
   const std::string path = device.path(kWhitelistFile);
   device.check("whitelist check", fails("cannot read " + path +
                                             ": No such file or directory: write a whitelist, as "
-                                            "docs/whitelist.md describes it",
+                                            "tavrel(8) describes it",
                                         2));
   device.write(kWhitelistFile, "<plist><dict>");
   device.check("whitelist check",

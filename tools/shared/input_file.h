@@ -12,8 +12,7 @@
 namespace tavrel {
 
 /// Completes the error of a device without a whitelist.
-inline constexpr const char* kWriteWhitelist =
-    ": write a whitelist, as docs/whitelist.md describes it";
+inline constexpr const char* kWriteWhitelist = ": write a whitelist, as tavrel(8) describes it";
 
 /// The content, at most `largest` bytes, of a file of this machine, or of standard input for "-".
 Expected<std::string> readInput(ToolContext& context, const std::string& file, std::size_t largest);
