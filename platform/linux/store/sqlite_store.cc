@@ -58,8 +58,12 @@ SqliteConnection SqliteStore::openForWriting(Sharing sharing) {
   std::error_code code;
   std::filesystem::create_directories(folder, code);
   if (code) {
-    const std::string checkOwner =
-        "check owner and permissions of " + folder.parent_path().string();
+    // The lowest folder above that is there; a relative path may have none.
+    std::filesystem::path above = folder.parent_path();
+    std::error_code ignored;
+    while (above.has_relative_path() && !std::filesystem::exists(above, ignored))
+      above = above.parent_path();
+    const std::string checkOwner = "check owner and permissions of " + above.string();
     throw StoreFailure{StoreFault::Refused, "its folder cannot be made: " + code.message() + ": " +
                                                 adviceFor(code.value(), checkOwner.c_str())};
   }

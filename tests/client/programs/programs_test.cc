@@ -57,6 +57,13 @@ TEST_F(Programs, TheToolSaysWhyItCannotRecord) {
                 ": memory or a limit of this process is exhausted: run 'tavrelctl stat fold' "
                 "or free space in /run\n");
   EXPECT_EQ(foldedScalars(), "com.norvane.n=2 n=1 ");
+  std::filesystem::remove_all(folder);
+  std::filesystem::remove_all(root / "var");
+  EXPECT_EQ(outputOf(asNobody + "stat add n 1", 1),
+            "tavrelctl: statistics store " + (root / "var/mobile/Library/Brimhold/").string() +
+                "BHDataStore.sqlitedb: its folder cannot be made: Permission denied: check owner "
+                "and permissions of " +
+                root.string() + "\n");
 }
 
 TEST_F(Programs, CollectsOnceWithRatesSinceTheRunBefore) {
