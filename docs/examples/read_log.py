@@ -21,7 +21,8 @@ for path in sys.argv[1:]:
     log, filed = load(path), load(path.removesuffix(".log") + ".metadata.plist")
     print(f"{log['BHStartDate']:%Y-%m-%d}  {filed['LogName']}, type {filed['LogType']}")
     print(f"  {filed['OSVersion']}, {filed.get('Options', {})}")
-    print(f"  whitelist {log['BHWhitelistDigest']}, tasking {log['BHTaskID']}")
+    print(f"  whitelist {log['BHWhitelistDigest']}")
+    print(f"  tasking {log['BHTaskID']}, settings {log['BHTasking']}")  # of any type
     for key, value in [*log["BHMetadata"].items(), *log["BHScalars"].items()]:
         print(f"  {key} = {value}")
     for key, (low, high, mean, squares, count) in log["BHDistributions"].items():
@@ -30,7 +31,5 @@ for path in sys.argv[1:]:
         histogram = log["BHDistributionsHistogram"].get(key, {})
         for label, values in sorted(histogram.items(), key=lower_end):
             print(f"    {label} {values}")
-    for setting in log["BHTasking"]:
-        print(f"  set {setting['Domain']} {setting['Key']} = {setting.get('Value')}")
     for app in log.get("BHActivatedAppInfo", []):
         print(f"  {app['bundle']} {app['version']} {app['uuid']}")

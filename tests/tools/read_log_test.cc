@@ -38,7 +38,8 @@ TEST(ReadLogTest, PrintsALogOfTheDaemon) {
   EXPECT_EQ(std::system(command.c_str()), 0);
   EXPECT_EQ(contentOf(printed), R"(2026-11-24  log-tallied, type 193
   Pellio 4.2 (16R349), {'previous_os_version': '<unknown>'}
-  whitelist eb42570d2e2f7addc42403d203dafde4, tasking t-7
+  whitelist eb42570d2e2f7addc42403d203dafde4
+  tasking t-7, settings [{'Domain': 'com.example', 'Key': 'interval', 'Value': 60}]
   BHPreferredUserInterfaceLanguage = de-AT
   BHUserInterfaceLanguage = de
   BHUserSetRegionFormat = AT
@@ -49,7 +50,6 @@ TEST(ReadLogTest, PrintsALogOfTheDaemon) {
     (10, 100] 1
     (100, inf) 1
   com.example.load: 1 from 0.25 to 0.25, mean 0.25, deviation 0
-  set com.example interval = 60
   com.example.walk 1.2 8D1F6C0E-55B5-4B0A-9C6B-0D1A53F3A1C2
 )");
 }
