@@ -75,5 +75,14 @@ TEST_F(Recording, InstalledUnitsNameTheirPrograms) {
             outputOf(TAVREL_BUILD "/bin/tavrel-statsd --version"));
 }
 
+TEST_F(Recording, InstalledDocumentsFindEachOther) {
+  const std::string to = root / "documents";
+  outputOf("cmake --install " TAVREL_BUILD " --prefix " + to + " --component tavrel-doc");
+  EXPECT_EQ(outputOf("cd " + to +
+                     "/share/doc/tavrel && grep -ohP '\\]\\(\\K[^):#]+(?=[)#])' *.md | "
+                     "xargs ls -d 2>&1 >/dev/null || true"),
+            "");
+}
+
 }  // namespace
 }  // namespace tavrel
