@@ -22,11 +22,20 @@ APPLICATION = {"bundle_id": "com.example.app", "version": "1.0",
 MESSAGES = [plistlib.dumps(message) for message in (
     {"operation": 0}, {"operation": 2, "app_data": [APPLICATION]})]
 
-# The programs to try, the library to preload, and a folder for the files of this process.
-here = types.SimpleNamespace(programs=None, library=None, work=None)
+# The programs to try, the library to preload, a folder for the files of this process, and the
+# process identifier of the program that it runs.
+here = types.SimpleNamespace(programs=None, library=None, work=None, running=None)
 
 
 def begin(folder, programs):
+    def stop(*_):
+        if here.running:
+            os.kill(here.running, signal.SIGKILL)
+        os._exit(1)
+
+    # An exception would only end the task at hand.
+    for number in (signal.SIGINT, signal.SIGTERM):
+        signal.signal(number, stop)
     here.programs, here.library = programs, folder / "failing_calls.so"
     here.work = pathlib.Path(tempfile.mkdtemp(dir=folder))
 
@@ -110,8 +119,10 @@ def finished(words, environment, passed=None):
                for number, path in enumerate(streams, 1)]
     if passed:
         actions.append((os.POSIX_SPAWN_DUP2, passed.fileno(), 3))
-    process = os.posix_spawn(words[0], words, environment, file_actions=actions)
-    if not ends_in_time(process):
+    process = here.running = os.posix_spawn(words[0], words, environment, file_actions=actions)
+    has_ended = ends_in_time(process)
+    here.running = None
+    if not has_ended:
         doing = threads_of(process)
         os.kill(process, signal.SIGKILL)
         os.waitpid(process, 0)
