@@ -1,5 +1,5 @@
 # A power cut in the daily run of the next day. The plug is pulled when the log is there and the run
-# is still at work, frozen so that it cannot end first. The watcher's priority is below the run's.
+# is still at work, frozen so that it cannot end first. The watcher has the same priority as the run.
 # shellcheck shell=sh disable=SC2034,SC2154 # Variables are shared by the parts.
 cat >/run/watch <<'WATCH'
 found=
