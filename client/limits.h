@@ -23,9 +23,14 @@ enum {
    * each costs CPU time, and a write to flash. */
   kAskSeconds = 60,
 
-  /* Segments in the folder beyond which a new one asks for a fold: short-lived processes leave
-   * one each, of 20 KiB. */
-  kSegmentsBeforeFold = 256,
+  /* Files in the folder beyond which new segments ask for folds: short-lived processes leave one
+   * each, of 20 KiB. */
+  kFilesBeforeFold = 256,
+
+  /* Of the segments begun beyond that, one in so many asks, whichever ones the clock picks: folds
+   * leave the files of live processes, and no program knows how many there are. A prime, which
+   * clocks that advance by a round number of nanoseconds reach as well. */
+  kSegmentsPerFold = 127,
 
   /* Names tried for a new file. They contain a time in nanoseconds; a collision means that a
    * process in another PID namespace began in the same nanosecond. */

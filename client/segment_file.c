@@ -182,8 +182,9 @@ struct Segment* bhBeginSegment(const char* folder, struct SegmentName* name,
     *status = BHClientStatusNotInMemory;
   } else {
     segment = beginIn(directory, name, status);
-    /* On a tmpfs, the size of a folder is 20 bytes per entry. */
-    if (fstat(directory, &entries) == 0 && entries.st_size / 20 > kSegmentsBeforeFold) {
+    /* On a tmpfs, the size of a folder is 20 bytes per entry, "." and ".." included. */
+    if (fstat(directory, &entries) == 0 && entries.st_size / 20 - 2 > kFilesBeforeFold &&
+        name->time % kSegmentsPerFold == 0) {
       bhPostFoldWanted(folder);
     }
   }

@@ -271,6 +271,16 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
   expectEachOnce(records["series"].size());
 }
 
+TEST_F(Recording, InAFolderWithManyFilesOneProgramIn127AsksForAFold) {
+  for (int file = 0; file < 255; ++file)
+    std::ofstream(folder / std::to_string(file)).close();
+  for (const auto& [before, asks] : {std::pair(1260, false), {1260, true}, {1270, false}}) {
+    testClock().monotonic = before;
+    run([] { add(1); });
+    EXPECT_EQ(std::filesystem::remove(folder / "fold-wanted"), asks) << segments().size();
+  }
+}
+
 TEST_F(Recording, AThreadMayStillRecordIntoAChunkThatIsEmptyAgain) {
   constexpr int kCount = 4 * kBHChunkRecords;
   run([&] {
