@@ -125,7 +125,10 @@ class Scalar:
         _library.BHClientScalarAdd(self._handle, _integer(amount))
 
     def set(self, value: typing.SupportsIndex) -> None:
-        """Replaces today's value, except what other processes have added since the last fold."""
+        """Replaces today's value.
+
+        What other processes have added since the last fold without setting it comes on top.
+        """
         _library.BHClientScalarSet(self._handle, _integer(value))
 
 

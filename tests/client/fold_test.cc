@@ -324,7 +324,10 @@ TEST_F(FoldTest, OfSetsTheLatestCountsAndAddsAreAdded) {
   while (segments().empty())
     sched_yield();
   for (const int amount : {100, 200})
-    run([&] { set(amount); });
+    run([&] {
+      set(amount);
+      BHClientScalarAdd(keys().gauge, 1);  // goes with its set
+    });
   later.open();
   EXPECT_EQ(waitFor(child), 0);
   run([] { BHClientScalarAdd(keys().gauge, 1000); });

@@ -28,8 +28,10 @@
  *    some milliseconds). While the clock is older than this library, as on a device that has just
  *    started without a battery clock, values are dated once it has been set.
  *  - A set replaces what this process added or set earlier that day; when two processes set a
- *    scalar, the later set counts. What other processes have added since the last fold, before
- *    the set or after it, comes on top.
+ *    scalar, the later set counts. What processes that have not set it since the last fold have
+ *    added since then, before the set or after it, comes on top. Adds that follow a process's own
+ *    set belong to that set: if another process has set the scalar later, the next fold drops
+ *    them with it, even those that came last.
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
@@ -65,7 +67,8 @@ BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char*
 
 /* Adds to today's value, which starts at 0. Sums wrap in two's complement. */
 BH_CLIENT_PUBLIC void BHClientScalarAdd(BHClientScalarKey* key, int64_t amount);
-/* Replaces today's value, except what other processes have added since the last fold. */
+/* Replaces today's value, except what other processes have added since the last fold without
+ * setting it. */
 BH_CLIENT_PUBLIC void BHClientScalarSet(BHClientScalarKey* key, int64_t value);
 
 /* Appends a measurement. */
