@@ -91,7 +91,12 @@ static struct Cell* currentCell(struct Process* process, struct Segment* segment
   /* Closed also when there is no other: after a fold, the key has at least this one. */
   struct Cell* left = atomic_exchange(&key->cell, cell);
   if (left && left != cell) closeCell(left);
-  if (!cell) bhDrop(process, segment);
+  _Atomic int* lack = &process->state->lacksCells;
+  if (cell) {
+    atomic_store_explicit(lack, 0, memory_order_relaxed);
+  } else {
+    bhDrop(process, segment, lack);
+  }
   return cell;
 }
 

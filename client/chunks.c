@@ -29,7 +29,8 @@ void bhNoticeFold(struct Process* process, struct Segment* segment) {
   for (uint32_t i = 0; i < usedChunks(segment); ++i)
     reusable += isReusable(&segment->chunks[i]);
   atomic_store_explicit(&state->reusableChunks, reusable, memory_order_relaxed);
-  atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
+  atomic_store_explicit(&state->lacksChunks, 0, memory_order_relaxed);
+  atomic_store_explicit(&state->lacksCells, 0, memory_order_relaxed);
   if (freeChunks(state, segment) >= kBHChunkCount / 2) {
     atomic_store_explicit(&state->hasFreedChunks, 1, memory_order_relaxed);
   }
@@ -98,7 +99,7 @@ static struct Chunk* takeChunk(struct Process* process, struct Segment* segment)
   if (freeChunks(state, segment) < kBHChunkCount / 4) {
     bhAskForFold(process, atomic_exchange(&state->hasFreedChunks, 0));
   }
-  if (chunk) atomic_store_explicit(&state->isFull, 0, memory_order_relaxed);
+  if (chunk) atomic_store_explicit(&state->lacksChunks, 0, memory_order_relaxed);
   return chunk;
 }
 
@@ -147,6 +148,8 @@ void bhRecordSlowly(struct Key* key, double value) {
   if (!bhIsKey(process, key)) return;
   struct Segment* segment = bhSegment(process);
   if (!segment) return;
-  if (!recordInto(process, segment, key, value)) bhDrop(process, segment);
+  if (!recordInto(process, segment, key, value)) {
+    bhDrop(process, segment, &process->state->lacksChunks);
+  }
   bhForgetInterrupted(process, segment);
 }

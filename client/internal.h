@@ -39,8 +39,8 @@ void bhForgetInterrupted(struct Process* process, const struct Segment* segment)
 bool bhFetch(const void* from, size_t bytes);
 /* Asks for a fold, unless it did so a short time ago and this is not urgent. */
 void bhAskForFold(struct Process* process, bool isUrgent);
-/* Counts a value for which there is no room. */
-void bhDrop(struct Process* process, struct Segment* segment);
+/* Counts a value for which there is no room, and notes in `State` what there is a lack of. */
+void bhDrop(struct Process* process, struct Segment* segment, _Atomic int* lack);
 
 /* segment_file.c */
 

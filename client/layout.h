@@ -101,9 +101,10 @@ struct State {
   _Atomic uint64_t knownFolds;       /* the segment's folds at the last count of reusable chunks */
   _Atomic int32_t reusableChunks;    /* approximate number that folds have acknowledged */
   _Atomic uint32_t nextReusable;     /* where to look for one */
-  _Atomic int isFull;
-  _Atomic uint64_t mayAskAt;  /* no fold is asked for before these CLOCK_MONOTONIC seconds */
-  _Atomic int hasFreedChunks; /* a fold made much room since one was last asked for */
+  _Atomic int lacksChunks;           /* the last measurement that needed memory was dropped */
+  _Atomic int lacksCells;            /* the last scalar that needed memory was dropped */
+  _Atomic uint64_t mayAskAt;         /* no fold is asked for before these CLOCK_MONOTONIC seconds */
+  _Atomic int hasFreedChunks;        /* a fold made much room since one was last asked for */
   struct Lane lanes[kLanes];
   struct Key keys[kBHKeys];
   _Atomic uint16_t older[kBHCellCount]; /* number of the same key's next older cell; 0 is none */

@@ -79,8 +79,8 @@ void bhAskForFold(struct Process* process, bool isUrgent) {
   }
 }
 
-void bhDrop(struct Process* process, struct Segment* segment) {
-  atomic_store_explicit(&process->state->isFull, 1, memory_order_relaxed);
+void bhDrop(struct Process* process, struct Segment* segment, _Atomic int* lack) {
+  atomic_store_explicit(lack, 1, memory_order_relaxed);
   bhAskForFold(process, false);
   atomic_fetch_add_explicit(&segment->dropped, 1, memory_order_relaxed);
 }
@@ -134,15 +134,20 @@ static BHClientStatus currentStatus(void) {
   struct Process* process = bhProcess();
   if (!process) return bhWasKeyRefused() ? BHClientStatusUnsupported : BHClientStatusNoKey;
   struct State* state = process->state;
-  if (!bhSegment(process)) {
-    return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
-  }
+  struct Segment* segment = bhSegment(process);
+  if (!segment) return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
+  /* The program may wait for room before it records again. */
+  bhNoticeFold(process, segment);
+  bhForgetInterrupted(process, segment);
   const struct SegmentName name = nameOfSegment(state);
   const BHClientStatus status =
       name.thread != 0 ? bhStatusOfFile(process->folder, name) : BHClientStatusRecording;
   /* Threads keep pointers into the segment, so that no other can take its place. */
   if (status == BHClientStatusRemoved) return status;
-  if (atomic_load_explicit(&state->isFull, memory_order_relaxed)) return BHClientStatusFull;
+  if (atomic_load_explicit(&state->lacksChunks, memory_order_relaxed) ||
+      atomic_load_explicit(&state->lacksCells, memory_order_relaxed)) {
+    return BHClientStatusFull;
+  }
   if (status == BHClientStatusCannotAsk) return status;
   return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
 }

@@ -202,6 +202,7 @@ TEST_F(Recording, WithoutFreshCellsEachScalarKeepsOne) {
       testClock().boot = second;
       add(1);
     }
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusFull);
     std::filesystem::remove(folder / "fold-wanted");
     testClock().coarse = 2000;
     int cells = kBHCellCount - kBHKeys;
@@ -211,6 +212,7 @@ TEST_F(Recording, WithoutFreshCellsEachScalarKeepsOne) {
       add(1);
       cells += day == 0 ? 2 : 1;
       EXPECT_EQ(std::filesystem::exists(folder / "fold-wanted"), cells > kBHCellCount * 3 / 4);
+      EXPECT_EQ(BHClientGetStatus(nullptr) == BHClientStatusRecording, day < kBHKeys - 1);
     }
     set(8);
     kill(getpid(), SIGSTOP);
@@ -254,6 +256,7 @@ TEST_F(Recording, AFullSegmentCountsWhatItDropsAndGoesOnAfterAFold) {
     EXPECT_STREQ(text, "the segment is full: values are dropped until a fold makes room");
     EXPECT_EQ(openDescriptors(), descriptors);
     kill(getpid(), SIGSTOP);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusRecording);
     i = 0;
     while (!isFoldWanted() && i < kRoom)
       record(i++);
