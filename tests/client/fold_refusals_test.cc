@@ -158,6 +158,8 @@ TEST_F(FoldTest, WhatIsNoSegmentIsRefusedOnce) {
   mkfifo((folder / "pipe.segment").c_str(), 0666);
   std::filesystem::create_directory(folder / "folder.segment");
   std::filesystem::create_directory(folder / "fold-wanted");
+  look(true);
+  EXPECT_EQ(scalars.at({"count", kToday}), 1) << "viewers leave the copy out";
   Lines lines;
   {
     LinuxPlatform other((DeviceRoot(root)));

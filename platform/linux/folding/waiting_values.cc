@@ -64,6 +64,7 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
   if (!listing) return listing.error();
   for (const auto& [owner, count] : listing->leftOut)
     waiting.leftOut_ += count;
+  SegmentNames found;
   FoldedRows rows;
   PendingDistributions buffer;
   for (const SegmentEntry& entry : listing->segments) {
@@ -76,23 +77,24 @@ Expected<WaitingValues> WaitingValues::read(const SegmentFolder& folder, const R
     if (!opening) return opening.error();
     // The next fold logs the refusal.
     if (!opening->segment) continue;
-    if (Status added = waiting.add(*opening->segment, recorders, history, selection, rows, buffer);
-        !added) {
-      return added.error();
-    }
+    Status added =
+        waiting.add(*opening->segment, recorders, history, selection, found, rows, buffer);
+    if (!added) return added.error();
   }
   return waiting;
 }
 
 Status WaitingValues::add(const OpenSegment& segment, const Recorders& recorders,
-                          SqliteHistory* history, const RowSelection& selection, FoldedRows& rows,
-                          PendingDistributions& buffer) {
+                          SqliteHistory* history, const RowSelection& selection,
+                          SegmentNames& found, FoldedRows& rows, PendingDistributions& buffer) {
   SegmentReader reader(segment.file.get());
   // No lease here: it could disturb a fold.
   const bool isWriterGone = findSegmentProcess(reader.facts()) == WriterPresence::Gone;
   const auto state = reader.state();
   if (Status done = reader.readable(); !done) return done;
   if (!state || *state != SegmentReader::State::Begun) return Done{};
+  // Folds refuse the copies of a segment.
+  if (!found.insert({segment.entry.owner, reader.facts().identity}).second) return Done{};
   SegmentPosition position;
   if (history != nullptr && history->hasStore()) {
     const auto stored = history->segmentPosition(segment.entry.owner, reader.facts().identity);

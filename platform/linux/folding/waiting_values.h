@@ -11,6 +11,7 @@
 
 #include "base/expected.h"
 #include "platform/linux/files/descriptor.h"
+#include "platform/linux/folding/position_budget.h"
 #include "platform/linux/folding/recorders.h"
 #include "platform/linux/folding/scalar_changes.h"
 #include "platform/linux/folding/segment_folder.h"
@@ -72,7 +73,8 @@ class WaitingValues {
  private:
   WaitingValues() = default;
   Status add(const OpenSegment& segment, const Recorders& recorders, SqliteHistory* history,
-             const RowSelection& selection, FoldedRows& rows, PendingDistributions& buffer);
+             const RowSelection& selection, SegmentNames& found, FoldedRows& rows,
+             PendingDistributions& buffer);
   Status addSeries(const RowSelection& selection, std::int32_t day, std::string_view key,
                    const DistributionBlock& block);
 
