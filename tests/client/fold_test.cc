@@ -434,24 +434,29 @@ TEST_F(FoldTest, AStoreDamagedWhereOnlyFoldsLookIsSetAside) {
 }
 
 TEST_F(FoldTest, ValuesWithoutADateWaitForTheClock) {
+  for (int i = 0; i < 2; ++i)
+    run([] { BHClientScalarAdd(keys().gauge, INT64_MAX); });
   testClock().realtime = 1000;
   testClock().boot = 100;
   run([] {
     add(1);
     record(0);
   });
-  const Descriptor segment(open(segments().at(0).c_str(), O_WRONLY | O_CLOEXEC));
+  const Descriptor segment(open(segments().back().c_str(), O_WRONLY | O_CLOEXEC));
   const std::uint64_t lost = 7;
   EXPECT_EQ(pwrite(segment.get(), &lost, sizeof lost, kBHHeaderDropped), 8);
   std::ofstream(folder / "junk").close();
   FoldReport report = foldNow();
-  EXPECT_EQ(report.removed + report.dropped + report.segmentsRefused, 0U);
+  EXPECT_EQ(report.refused, 1U);  // the sum does not fit
+  EXPECT_EQ(report.removed, 2U);
+  EXPECT_EQ(report.dropped + report.segmentsRefused, 0U);
   testClock().realtime = kToday * 86'400;
   report = foldNow();
   EXPECT_EQ(report.dropped, 7U);
   EXPECT_EQ(report.segmentsRefused, 1U);
   look();
   EXPECT_EQ(scalar("com.norvane.brimhold.segments_refused", kToday), 1);
+  EXPECT_EQ(scalar("com.norvane.brimhold.refused", kToday), 1);
   EXPECT_EQ(scalar("count", kToday), 1);
   expectEachOnce(1);
 }

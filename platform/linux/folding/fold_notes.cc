@@ -20,6 +20,9 @@ constexpr LockPatience kPatience{600'000, "it is folding: try again later"};
 // be counted once; lines beyond this number are counted in each fold.
 constexpr std::size_t kRemembered = 8192;
 
+// The two counts in front of the remembered lines.
+constexpr std::size_t kHeaderBytes = 16;
+
 }  // namespace
 
 Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, SystemLog& log) {
@@ -29,11 +32,12 @@ Expected<FoldNotes> FoldNotes::lock(const DeviceRoot& root, FileSystem& files, S
 }
 
 FoldNotes::FoldNotes(Descriptor file, SystemLog& log) : file_(std::move(file)), log_(log) {
-  std::string content((1 + kRemembered) * sizeof(std::uint64_t), '\0');
+  std::string content(kHeaderBytes + kRemembered * sizeof(std::uint64_t), '\0');
   const ssize_t size = pread(file_.get(), content.data(), content.size(), 0);
   content.resize(size > 0 ? static_cast<std::size_t>(size) : 0);
   uncountedFiles_ = loadLittle64(asBytes(content), 0).value_or(0);
-  for (std::size_t at = 8; at + 8 <= content.size(); at += 8)
+  uncountedValues_ = loadLittle64(asBytes(content), 8).value_or(0);
+  for (std::size_t at = kHeaderBytes; at + 8 <= content.size(); at += 8)
     logged_.insert(*loadLittle64(asBytes(content), at));
 }
 
@@ -57,9 +61,14 @@ void FoldNotes::refuse(std::string_view line) {
   hasChanged_ = true;
 }
 
-void FoldNotes::clearUncountedFiles() {
-  hasChanged_ = hasChanged_ || uncountedFiles_ > 0;
-  uncountedFiles_ = 0;
+void FoldNotes::addUncountedValues(std::uint64_t count) {
+  uncountedValues_ += count;
+  hasChanged_ = hasChanged_ || count > 0;
+}
+
+void FoldNotes::clearUncounted() {
+  hasChanged_ = hasChanged_ || uncountedFiles_ > 0 || uncountedValues_ > 0;
+  uncountedFiles_ = uncountedValues_ = 0;
 }
 
 void FoldNotes::mark() {
@@ -87,6 +96,7 @@ void FoldNotes::save() {
     content += asText(bytes);
   };
   append(uncountedFiles_);
+  append(uncountedValues_);
   for (const std::uint64_t digest : logged_)
     append(digest);
   if (pwrite(file_.get(), content.data(), content.size(), 0) < 0) {

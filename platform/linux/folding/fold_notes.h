@@ -2,8 +2,8 @@
 // already.
 //
 // A refused file stays where it is, so every fold meets it again. The lock file, which lives until
-// the device restarts, remembers which lines were logged, and how many refused files await being
-// counted in the store.
+// the device restarts, remembers which lines were logged, and how many refusals await being counted
+// in the store.
 #pragma once
 
 #include <cstdint>
@@ -33,8 +33,11 @@ class FoldNotes {
   void refuse(std::string_view line);
   /// Refused files that no store counts yet, with those of earlier folds, which failed.
   std::uint64_t uncountedFiles() const { return uncountedFiles_; }
-  /// After the commit that counts them.
-  void clearUncountedFiles();
+  /// Values that folds have refused, and that no store counts yet.
+  std::uint64_t uncountedValues() const { return uncountedValues_; }
+  void addUncountedValues(std::uint64_t count);
+  /// After the commit that counts files and values.
+  void clearUncounted();
 
   /// Marks that a transaction has taken values. Call it before the segments lose them.
   void mark();
@@ -52,6 +55,7 @@ class FoldNotes {
   SystemLog& log_;
   std::unordered_set<std::uint64_t> logged_;  // first 8 bytes of the lines' SHA-256
   std::uint64_t uncountedFiles_ = 0;
+  std::uint64_t uncountedValues_ = 0;
   bool hasChanged_ = false;
   std::uint64_t leftOut_ = 0;
 };

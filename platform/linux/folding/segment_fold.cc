@@ -79,8 +79,12 @@ class FoldRun {
   void logLimit(std::uint32_t owner, std::string_view limit);
   bool isStoreFull() const;
   void finishSegments();
-  /// The refused files that this fold counts: none while there is no day to count them under.
+  /// The refused files and values that this transaction counts: none while there is no day to count
+  /// them under.
   std::uint64_t filesToCount() const { return boot_ ? notes_.uncountedFiles() : 0; }
+  std::uint64_t valuesToCount() const {
+    return boot_ ? notes_.uncountedValues() + counts_.refused : 0;
+  }
 
   const SegmentFolder& folder_;
   SqliteStore& store_;
@@ -117,7 +121,7 @@ Status FoldRun::run(const SegmentFolder::Listing& listing) {
   unseen_.insert(listing.linked.begin(), listing.linked.end());
   for (const std::string& line : listing.refusals)
     notes_.refuse(line);
-  if (listing.segments.empty() && filesToCount() == 0) return Done{};
+  if (listing.segments.empty() && filesToCount() + valuesToCount() == 0) return Done{};
   do {
     auto batch = store_.beginBatch(Sharing::Avoided);
     if (!batch) return batch.error();
@@ -161,7 +165,7 @@ Status FoldRun::fillBatch(SqliteBatch& batch, const SegmentFolder::Listing& list
   counts_.refused += changes_.overflows() + *refused;
   const std::pair<const char*, std::uint64_t> figures[] = {
       {"com.norvane.brimhold.dropped", counts_.dropped},
-      {"com.norvane.brimhold.refused", counts_.refused},
+      {"com.norvane.brimhold.refused", valuesToCount()},
       {"com.norvane.brimhold.segments_refused", filesToCount()},
   };
   ScalarChanges own;
@@ -357,7 +361,11 @@ void FoldRun::finishSegments() {
   report_.dropped += counts_.dropped;
   report_.refused += counts_.refused;
   report_.segmentsRefused += filesToCount();
-  if (boot_) notes_.clearUncountedFiles();
+  if (boot_) {
+    notes_.clearUncounted();
+  } else {
+    notes_.addUncountedValues(counts_.refused);
+  }
   counts_ = {};
 }
 
@@ -395,7 +403,8 @@ FoldReport SegmentFold::run() {
   const Expected<SegmentFolder::Listing> listing = (*folder)->list();
   if (!listing) {
     report.failure = listing.error().message;
-  } else if (!listing->segments.empty() || !listing->refusals.empty()) {
+  } else if (!listing->segments.empty() || !listing->refusals.empty() ||
+             notes->uncountedValues() > 0) {
     const Recorders recorders = Recorders::read(root_, files_, propertyLists_, log_);
     // While the limits file has a fault, the bound of the store is unknown.
     const auto bounds = DeviceLimits::read(root_, files_, propertyLists_);
