@@ -13,16 +13,17 @@
 
 /* process.c */
 
-/* The library's memory; NULL before the first look-up, and when the kernel lacks a feature. */
+/* The library's memory; NULL before the first look-up, and while it cannot be created. */
 struct Process* bhProcess(void);
-/* The same, but creates the memory when it is missing. */
-struct Process* bhMakeProcess(void);
+/* The same, but creates the memory when it is missing; NULL with `status` on failure. */
+struct Process* bhMakeProcess(BHClientStatus* status);
 
 /* keys.c */
 
 /* Names the key in the segment. Returns its number, or 0 when there is no memory for it. */
 uint32_t bhNameKey(struct Process* process, struct Segment* segment, struct Key* key);
-bool bhWasKeyRefused(void);
+/* Why a key was refused last; Recording when none was. */
+BHClientStatus bhRefusal(void);
 /* Whether `key` is in the table of keys; the handle of refused keys is not. */
 bool bhIsKey(const struct Process* process, const struct Key* key);
 

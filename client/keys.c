@@ -11,12 +11,12 @@ static _Atomic uint32_t usedNames;
 static _Atomic uint32_t usedKeys;
 static uint64_t entries[kBHKeys];          /* in a segment's format */
 static _Atomic uint32_t buckets[kBuckets]; /* index + 1 */
-static _Atomic int wasKeyRefused;
+static _Atomic int refusal;                /* why a key was refused last */
 
 static struct Key refusedKey;
 
-bool bhWasKeyRefused(void) {
-  return atomic_load_explicit(&wasKeyRefused, memory_order_relaxed);
+BHClientStatus bhRefusal(void) {
+  return (BHClientStatus)atomic_load_explicit(&refusal, memory_order_relaxed);
 }
 
 bool bhIsKey(const struct Process* process, const struct Key* key) {
@@ -57,8 +57,8 @@ static uint32_t addKey(const char* name, uint32_t length, uint32_t kind) {
   return index + 1;
 }
 
-static struct Key* refuse(void) {
-  atomic_store_explicit(&wasKeyRefused, 1, memory_order_relaxed);
+static struct Key* refuse(BHClientStatus why) {
+  atomic_store_explicit(&refusal, why, memory_order_relaxed);
   return &refusedKey;
 }
 
@@ -92,17 +92,19 @@ static size_t lengthOfName(const char* name) {
 
 static struct Key* keyFor(const char* name, uint32_t kind) {
   const int error = errno;
-  struct Process* process = bhMakeProcess();
+  BHClientStatus status = BHClientStatusFailed;
+  struct Process* process = bhMakeProcess(&status);
   errno = error;
+  if (!process) return refuse(status);
   const size_t length = lengthOfName(name);
-  if (!process || length == 0) return refuse();
+  if (length == 0) return refuse(BHClientStatusKeyRefused);
 
   uint32_t added = 0;
   for (uint32_t at = hashOf(name, (uint32_t)length, kind);; ++at) {
     uint32_t found = atomic_load_explicit(&buckets[at % kBuckets], memory_order_acquire);
     if (found == 0) {
       if (added == 0) added = addKey(name, (uint32_t)length, kind);
-      if (added == 0) return refuse();
+      if (added == 0) return refuse(BHClientStatusKeyRefused);
       /* The loser of a race leaves its entry unused. */
       if (atomic_compare_exchange_strong_explicit(&buckets[at % kBuckets], &found, added,
                                                   memory_order_acq_rel, memory_order_acquire)) {

@@ -43,12 +43,13 @@ __attribute__((constructor)) static void registerForForks(void) {
   pthread_atfork(NULL, NULL, bhForgetParent);
 }
 
-struct Process* bhMakeProcess(void) {
+struct Process* bhMakeProcess(BHClientStatus* status) {
   struct Process* known = bhProcess();
   if (known) return known;
 
   struct Process* process = mapMemory(sizeof *process);
   struct State* state = mapMemory(sizeof *state);
+  *status = process && state ? BHClientStatusUnsupported : BHClientStatusNoSpace;
   if (process && state && findFolder(process->folder) &&
       madvise(state, sizeof *state, MADV_WIPEONFORK) == 0) {
     process->state = state;

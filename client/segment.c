@@ -102,7 +102,8 @@ static const char* textOf(BHClientStatus status) {
       return "the tmpfs of /run/tavrel/stat, or a limit of the process, is exhausted: nothing is "
              "recorded";
     case BHClientStatusUnsupported:
-      return "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long: nothing is recorded";
+      return "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long or relative to a folder "
+             "that is gone: nothing is recorded";
     case BHClientStatusFailed:
       return "the system failed to create a file in /run/tavrel/stat: nothing is recorded";
     case BHClientStatusFull:
@@ -115,8 +116,8 @@ static const char* textOf(BHClientStatus status) {
              "user, root folder or mounts, cannot ask for a fold in /run/tavrel/stat";
     case BHClientStatusKeyRefused:
       return "values are recorded, except those of a refused key: it is empty, longer than 1024 "
-             "bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or 256 KiB of "
-             "names that a process may have";
+             "bytes, has control characters, is not UTF-8, exceeds the 4096 keys or 256 KiB of "
+             "names that a process may have, or was looked up when there was no memory";
   }
   return "unknown status";
 }
@@ -131,8 +132,9 @@ static struct SegmentName nameOfSegment(struct State* state) {
 }
 
 static BHClientStatus currentStatus(void) {
+  const BHClientStatus refusal = bhRefusal();
   struct Process* process = bhProcess();
-  if (!process) return bhWasKeyRefused() ? BHClientStatusUnsupported : BHClientStatusNoKey;
+  if (!process) return refusal == BHClientStatusRecording ? BHClientStatusNoKey : refusal;
   struct State* state = process->state;
   struct Segment* segment = bhSegment(process);
   if (!segment) return (BHClientStatus)atomic_load_explicit(&state->status, memory_order_relaxed);
@@ -149,7 +151,7 @@ static BHClientStatus currentStatus(void) {
     return BHClientStatusFull;
   }
   if (status == BHClientStatusCannotAsk) return status;
-  return bhWasKeyRefused() ? BHClientStatusKeyRefused : BHClientStatusRecording;
+  return refusal == BHClientStatusRecording ? refusal : BHClientStatusKeyRefused;
 }
 
 BHClientStatus BHClientGetStatus(const char** text) {

@@ -36,6 +36,7 @@ static BHClientStatus statusOf(int error) {
     case EDQUOT:
     case EFBIG:
     case ENOMEM:
+    case EAGAIN: /* memory could not be locked */
     case EMFILE:
     case ENFILE:
     case EFAULT: /* memory could not be allocated */

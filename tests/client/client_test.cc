@@ -490,7 +490,8 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
       {elsewhere, BHClientStatusNotInMemory,
        "/run/tavrel/stat is not on a tmpfs: nothing is recorded"},
       {"/" + longest, BHClientStatusUnsupported,
-       "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long: nothing is recorded"},
+       "the kernel lacks MADV_WIPEONFORK, or TAVREL_ROOT is too long or relative to a folder that "
+       "is gone: nothing is recorded"},
       {longest, BHClientStatusRecording, "values are recorded"},
   };
   for (const auto& [device, status, text] : cases) {
@@ -518,6 +519,16 @@ TEST_F(Recording, WithoutAPlaceTheCallsDoNothingAndSayWhy) {
     setenv("TAVREL_ROOT", "device", 1);
     add(1);
     EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusUnsupported);
+  });
+  run([] {
+    mapError = ENOMEM;
+    BHClientScalarForKey("count");
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusNoSpace);
+    mapError = 0;
+    keys();
+    mapError = EAGAIN;  // as after mlockall(MCL_FUTURE)
+    add(1);
+    EXPECT_EQ(BHClientGetStatus(nullptr), BHClientStatusNoSpace);
   });
   EXPECT_TRUE(std::filesystem::is_empty(elsewhere + "/run/tavrel/stat"));
   EXPECT_EQ(segments().size(), 1U);
@@ -566,8 +577,9 @@ TEST_F(Recording, KeysAreLookedUpOnceAndRefusedWhenTheyAreNone) {
     EXPECT_EQ(BHClientGetStatus(&text), BHClientStatusKeyRefused);
     EXPECT_STREQ(text,
                  "values are recorded, except those of a refused key: it is empty, longer than "
-                 "1024 bytes, has control characters, is not UTF-8, or exceeds the 4096 keys or "
-                 "256 KiB of names that a process may have");
+                 "1024 bytes, has control characters, is not UTF-8, exceeds the 4096 keys or "
+                 "256 KiB of names that a process may have, or was looked up when there was no "
+                 "memory");
   });
   fold();
   EXPECT_EQ(scalars.size(), std::size_t{kBHKeys - 4});  // "a", "b" and 0 leave nothing

@@ -41,6 +41,10 @@ long __wrap_sysconf(int name) {
 }
 
 void* wrappedMap(void* from, std::size_t bytes, int access, int flags, int file, off_t offset) {
+  if (tavrel::mapError != 0) {
+    errno = tavrel::mapError;
+    return MAP_FAILED;
+  }
   if (tavrel::largePages && from == nullptr) {
     void* const room =
         realMap(nullptr, bytes + kLargePage, PROT_NONE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
@@ -70,6 +74,7 @@ int wrappedClock(clockid_t clock, timespec* now) {
 namespace tavrel {
 
 std::function<void()> whileFetching;
+int mapError = 0;
 bool largePages = false;
 bool isOldKernel = false;
 

@@ -41,6 +41,8 @@ TestClock& testClock();
 /// Called whenever libbrimhold allocates memory.
 extern std::function<void()> whileFetching;
 
+/// Why no memory can be mapped; 0 when it can.
+extern int mapError;
 /// Whether the kernel seems to have pages of 16 KiB.
 extern bool largePages;
 /// Whether the kernel seems to be older than Linux 5.14.

@@ -60,8 +60,9 @@ typedef struct BHClientDistributionKey BHClientDistributionKey;
 
 /* Looks up a key; the same name gives the same handle. The name is copied. Never returns NULL: the
  * values of a refused key are dropped. A key is refused when it is NULL, empty or longer than 1024
- * bytes, has control characters or is not UTF-8, or when the process would have more than 4096 keys
- * or 256 KiB of names. The other calls accept NULL, and drop the value. */
+ * bytes, has control characters or is not UTF-8, when the process would have more than 4096 keys
+ * or 256 KiB of names, and when there is no memory for the library yet: then look it up again. The
+ * other calls accept NULL, and drop the value. */
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 
@@ -97,7 +98,7 @@ typedef enum BHClientStatus {
   BHClientStatusNotAllowed = 3,  /* this user may not create files in it */
   BHClientStatusNotInMemory = 4, /* the folder is not on a tmpfs */
   BHClientStatusNoSpace = 5,     /* the tmpfs or a limit of the process is exhausted */
-  BHClientStatusUnsupported = 6, /* the kernel lacks what the library needs (Linux 4.14) */
+  BHClientStatusUnsupported = 6, /* the kernel is older than 4.14, or TAVREL_ROOT is unusable */
   BHClientStatusFailed = 7,      /* the system failed for another reason */
   BHClientStatusFull = 8,        /* values are dropped until a fold makes room */
   BHClientStatusKeyRefused = 9,  /* values are kept, but a look-up was refused */
