@@ -61,7 +61,8 @@ class ScopedTimer {
   BHClientTimer timer_ = BHClientTimerStart();
 };
 
-/// Why values are not kept, as a sentence; empty while they are.
+/// The sentence of `BHClientGetStatus`; empty when all is well. Not empty, although values are
+/// kept, when a key was refused or the process cannot ask for folds.
 inline std::string_view whyNotRecording() noexcept {
   const char* text = nullptr;
   return BHClientGetStatus(&text) == BHClientStatusRecording ? std::string_view() : text;
