@@ -63,6 +63,12 @@ void take(Expected<Figures> figures, std::string_view from, Reading& reading) {
   }
 }
 
+// Without figures nothing is known of a drive, which is not the same as nothing wrong.
+void noteAbsence(Reading& reading) {
+  if (reading.figures.empty() && reading.error.empty())
+    reading.error = "it reports no health figures";
+}
+
 }  // namespace
 
 Reading readWithoutCommands(const Drive& drive) {
@@ -98,7 +104,7 @@ Reading readWithoutCommands(const Drive& drive) {
       reading.figures = attributeFigures(drive.folder, ubiKinds());
       break;
   }
-  if (reading.figures.empty()) reading.error = "it reports no health figures";
+  noteAbsence(reading);
   return reading;
 }
 
@@ -137,6 +143,7 @@ std::optional<Reading> HealthReader::readDrive(const Drive& drive) {
     // Without permission to ask the card, use what the kernel has read from it.
     if (reading.from.empty()) reading = readWithoutCommands(drive);
   }
+  noteAbsence(reading);
   reading.time = moment_.seconds;
   reading.boot = moment_.boot;
   if (!reading.error.empty()) {
