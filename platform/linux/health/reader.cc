@@ -207,13 +207,17 @@ bool HealthReader::write(const Reading& reading) {
   return static_cast<bool>(written);
 }
 
-bool HealthReader::keep() {
-  const auto document = encodeMemory(memory_);
+bool HealthReader::keep(Memory memory) {
+  const auto document = encodeMemory(memory);
   const Status kept = document ? files_.replace(root_.path(kMemoryFile), asBytes(*document), 0600)
                                : Status(document.error());
-  if (!kept) log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
-  if (kept) memoryFile_ = *document;
-  return static_cast<bool>(kept);
+  if (!kept) {
+    log_.log(LogLevel::Error, "cannot keep counters: %s", kept.error().message);
+    return false;
+  }
+  memoryFile_ = *document;
+  memory_ = std::move(memory);
+  return true;
 }
 
 Expected<std::vector<Drive>> HealthReader::lookForDrives() {
@@ -259,15 +263,16 @@ bool HealthReader::isReadByLaterRun(const std::string& identity) const {
 }
 
 bool HealthReader::store(std::span<Taken> taken, bool isMemoryLocked) {
+  Memory advanced = memory_;
   bool hasGrowth = false;
   for (auto& [identity, reading] : taken) {
     if (!reading.error.empty() || !hasRunDay_ || !isMemoryLocked) continue;
-    reading.growth = takeGrowth(memory_.drives[identity], reading.figures, moment_);
+    reading.growth = takeGrowth(advanced.drives[identity], reading.figures, moment_);
     hasGrowth = true;
   }
   // Store the memory before anybody sees the growth, or the next run would count it again: the
   // next drive may never answer.
-  const bool isKept = isMemoryLocked && (!hasGrowth || keep());
+  const bool isKept = isMemoryLocked && (!hasGrowth || keep(std::move(advanced)));
   bool isDone = isKept;
   for (auto& [identity, reading] : taken) {
     if (!isKept) reading.growth.clear();
@@ -330,7 +335,7 @@ bool HealthReader::readAll(std::int64_t nowSeconds) {
   if (memory_.forgetOld(moment_.seconds)) {
     const auto lock = lockMemory();
     memory_.forgetOld(moment_.seconds);
-    isDone = lock && keep() && isDone;
+    isDone = lock && keep(memory_) && isDone;
   }
   return removeGone() && isDone;
 }

@@ -58,7 +58,9 @@ class HealthReader {
   /// Stores once what is remembered of drives, then their readings.
   bool store(std::span<Taken> taken, bool isMemoryLocked);
   bool write(const Reading& reading);
-  bool keep();
+  /// Stores what is to be remembered. `memory_` stays as it was when that fails, so that the growth
+  /// that no reading shows counts again.
+  bool keep(Memory memory);
   Expected<std::vector<Drive>> lookForDrives();
   bool removeGone();
 
