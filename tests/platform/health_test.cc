@@ -139,6 +139,7 @@ TEST(HealthTest, AtaSmart) {
   add(blob, "IDFY", identify);
   add(blob, "SMST", {{}, {}, {}, std::byte{1}});
   add(blob, "SMDT", data);
+  EXPECT_FALSE(valuesOf(*ataFigures(blob)).contains("failing_attributes")) << "no thresholds";
   add(blob, "SMTH", thresholds);
   const auto figures = ataFigures(blob);
   ASSERT_TRUE(figures) << figures.error().message;

@@ -40,6 +40,7 @@ constexpr std::uint64_t kZeroCelsius = 273'150;
 struct Collected {
   Figures figures;
   std::int64_t failing = 0;
+  bool hasThresholds = false;
 
   void add(Row row, std::uint64_t value) {
     constexpr std::uint64_t kLargest = std::numeric_limits<std::int64_t>::max();
@@ -49,6 +50,7 @@ struct Collected {
 
 void takeAttribute(SkDisk*, const SkSmartAttributeParsedData* attribute, void* target) {
   Collected& collected = *static_cast<Collected*>(target);
+  if (attribute->threshold_valid) collected.hasThresholds = true;
   if (attribute->prefailure && attribute->good_now_valid && !attribute->good_now) {
     ++collected.failing;
   }
@@ -90,7 +92,9 @@ Expected<Figures> ataFigures(ByteSpan blob) {
   }
   if (ata.smart_get_power_cycle(opened, &value) == 0) collected.add(kPowerCycles, value);
   if (ata.smart_get_bad(opened, &value) == 0) collected.add(kBad, value);
-  collected.add(kFailing, static_cast<std::uint64_t>(collected.failing));
+  // Drives may refuse the obsolete command for their thresholds.
+  if (collected.hasThresholds)
+    collected.add(kFailing, static_cast<std::uint64_t>(collected.failing));
   return std::move(collected.figures);
 }
 
