@@ -43,8 +43,11 @@ TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
   for (const auto& [rule, instant, text, pattern] : kCases) {
     const TemporaryRoot device;  // a separate file for each zone
     device.write("/etc/localtime", rule ? zoneFile(rule) : "no zone file");
-    LinuxDateFormatting formatting(device.root);
-    EXPECT_EQ(formatting.format(plist::Date::since1970(instant), pattern, "en_US_POSIX"), text);
+    const DeviceRoot relative(std::filesystem::relative(device.root.path("/")));
+    for (const DeviceRoot* root : {&device.root, &relative}) {
+      LinuxDateFormatting formatting(*root);
+      EXPECT_EQ(formatting.format(plist::Date::since1970(instant), pattern, "en_US_POSIX"), text);
+    }
   }
 }
 

@@ -3,6 +3,8 @@
 #include <cstdint>
 #include <cstdlib>
 #include <ctime>
+#include <filesystem>
+#include <system_error>
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
@@ -13,9 +15,11 @@ namespace tavrel {
 namespace {
 
 // Seconds east of UTC at an instant. The C library reads zone files, but lets a program choose one
-// only through the environment variable TZ.
+// only through the environment variable TZ, and looks up a relative path in its own folder.
 std::int64_t offsetAt(std::int64_t seconds, const std::string& zoneFile) {
-  ::setenv("TZ", (':' + zoneFile).c_str(), 1);
+  std::error_code unknown;
+  const std::string path = std::filesystem::absolute(zoneFile, unknown).string();
+  ::setenv("TZ", (':' + path).c_str(), 1);
   ::tzset();
   const std::time_t instant = seconds;
   std::tm local{};
