@@ -160,6 +160,7 @@ TEST(Upload, SaysWhatIsWrongWithItsConfiguration) {
       {url + "https://a /b</string>", noUrl},
       {url + "https://u@a/b</string>", more},
       {url + "https://a/b?c</string>", more},
+      {url + "https://a/b#</string>", more},
       {"<key>Url</key><string/>", "Url is not a setting: see tavrel-upload(8)"},
       {"<key>StallSeconds</key><integer>0</integer>", "StallSeconds" + noTime},
       {"<key>RunSeconds</key><real>5</real>", "RunSeconds" + noTime},
