@@ -208,6 +208,9 @@ TEST(Upload, KeepsARefusedLogBesideThoseOfAClockThatWasAhead) {
   ASSERT_EQ(names.size(), 2 * 16U);
   EXPECT_EQ(names[0], nameOf(1) + ".log");
   EXPECT_EQ(names[2], "log-tallied-20370101T000011Z-5f0c9a1e.log");
+  device.add(nameOf(2));
+  EXPECT_EQ(device.runAgainst(server), Outcome::Done);
+  EXPECT_EQ(device.names("refused").size(), 2 * 16U) << "the large log left its place to another";
 }
 
 TEST(Upload, AsksThePermissionBeforeAndDuringEachTransfer) {

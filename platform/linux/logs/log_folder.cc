@@ -108,9 +108,9 @@ Status LogFolder::keepNewest(std::size_t count, std::uint64_t bytes, std::string
   for (const auto& [seconds, name] : logs) {
     const auto status = FileSystem::status(logPath(name));
     const std::uint64_t size = status ? static_cast<std::uint64_t>(status->st_size) : 0;
-    // A log that alone exceeds the bound displaces no others.
+    // A log that alone exceeds the bound displaces no others by its size.
     if (size <= bytes) bytesKept += size;
-    ++kept;
+    if (size <= bytes || name == fresh) ++kept;
     if (name == fresh || (kept <= count && size <= bytes && bytesKept <= bytes)) continue;
     if (Status removed = removeLog(name); !removed && outcome) outcome = removed;
   }
