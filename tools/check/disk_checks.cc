@@ -27,7 +27,7 @@ void checkDisks(CheckScene& scene) {
     Check check{"disk", disk.reading.name, stateOf(disk.verdict), disk.verdict.word()};
     for (const std::string& reason : disk.verdict.reasons)
       check.text += ", " + reason;
-    check.text += format(", read %s ago", ageText(disk.age));
+    if (disk.age) check.text += format(", read %s ago", ageText(*disk.age));
     check.figures.push_back({&kProblems, static_cast<double>(disk.verdict.problems)});
     scene.checks.push_back(std::move(check));
   }

@@ -2,6 +2,8 @@
 #pragma once
 
 #include <cstdint>
+#include <optional>
+#include <string_view>
 #include <vector>
 
 #include "base/expected.h"
@@ -14,7 +16,7 @@ namespace tavrel {
 struct Disk {
   health::Reading reading;
   health::Verdict verdict;
-  std::int64_t age = 0;  // seconds
+  std::optional<std::int64_t> age;  // seconds since it was read; nothing when it never was
 };
 
 struct DiskList {
@@ -24,5 +26,13 @@ struct DiskList {
 
 /// Every drive of the machine, plus drives that only have a reading.
 DiskList findDisks(ToolContext& context);
+
+struct Wear {
+  std::string_view figure;
+  std::int64_t percent = 0;
+};
+
+/// The largest figure of a drive's wear; nothing when it reports none.
+std::optional<Wear> wearOf(const Disk& disk);
 
 }  // namespace tavrel

@@ -6,6 +6,7 @@
 #include <ostream>
 
 #include "base/format.h"
+#include "base/iso_date.h"
 #include "base/quantity_text.h"
 #include "base/text.h"
 #include "tools/disks/disk_list.h"
@@ -24,9 +25,8 @@ const std::int64_t* firstOf(const Disk& disk, std::initializer_list<std::string_
   return nullptr;
 }
 
-std::string percentOf(const Disk& disk, std::initializer_list<std::string_view> names) {
-  const std::int64_t* const value = firstOf(disk, names);
-  return value ? format("%lld %%", *value) : "-";
+std::string percentText(std::int64_t percent) {
+  return format("%lld %%", percent);
 }
 
 std::string bytesOf(const Disk& disk, std::string_view name) {
@@ -70,25 +70,27 @@ void printTable(ToolContext& context, const std::vector<Disk>& disks) {
   };
   for (const Disk& disk : disks) {
     const Reading& reading = disk.reading;
+    const auto wear = wearOf(disk);
+    const std::int64_t* const spare = firstOf(disk, {"spare_pct"});
     const std::int64_t* const temperature = firstOf(disk, {"temperature"});
     table.add({reading.name,
                reading.model,
                reading.firmware,
                reading.capacity ? sizeText(static_cast<double>(*reading.capacity)) : "-",
-               percentOf(disk, {"used_pct", "life_a_pct", "life_b_pct"}),
-               percentOf(disk, {"spare_pct"}),
+               wear ? percentText(wear->percent) : "-",
+               spare ? percentText(*spare) : "-",
                temperature ? valueText(kMillidegrees, *temperature) : "-",
                bytesOf(disk, "written"),
                bytesOf(disk, "read"),
                count(firstOf(disk, {"media_errors", "bad_sectors", "ecc_failures"})),
                count(firstOf(disk, {"power_on_hours"})),
-               ageText(disk.age),
+               disk.age ? ageText(*disk.age) : "-",
                {disk.verdict.word(), emphasisOf(disk.verdict)}});
   }
   table.print(context.page());
   for (const Disk& disk : disks) {
     for (const std::string& reason : disk.verdict.reasons)
-      context.out() << disk.reading.name << ": " << printable(reason) << '\n';
+      context.out() << printable(disk.reading.name) << ": " << printable(reason) << '\n';
   }
 }
 
@@ -96,7 +98,7 @@ void printFigures(ToolContext& context, const std::vector<Disk>& disks) {
   for (const Disk& disk : disks) {
     const std::string from =
         disk.reading.from.empty() ? std::string() : "  from " + disk.reading.from;
-    context.out() << '\n' << disk.reading.name << printable(from) << '\n';
+    context.out() << '\n' << printable(disk.reading.name + from) << '\n';
     Table table({{""}, {"", Table::Align::Right}, {""}, {""}}, 2);
     for (const NamedFigure& figure : figuresOf({disk.reading})) {
       table.add({figure.name, valueText(figure.unit, figure.value), std::string(figure.source),
@@ -115,13 +117,14 @@ Json jsonOf(const Figures& figures) {
 
 Json jsonOf(const Disk& disk, bool showsSources) {
   const Reading& reading = disk.reading;
+  const auto time = plist::Date::since1970(static_cast<double>(reading.time));
   Json json = {{"name", reading.name},
                {"kind", nameOf(reading.kind)},
                {"model", reading.model},
                {"firmware", reading.firmware},
                {"capacity_bytes", reading.capacity ? Json(*reading.capacity) : Json(nullptr)},
-               {"time", dateText(plist::Date::since1970(static_cast<double>(reading.time)))},
-               {"age_seconds", disk.age},
+               {"time", disk.age ? Json(isoDateText(time)) : Json(nullptr)},
+               {"age_seconds", disk.age ? Json(*disk.age) : Json(nullptr)},
                {"from", reading.from},
                {"error", reading.error.empty() ? Json(nullptr) : Json(reading.error)},
                {"verdict", disk.verdict.word()},

@@ -57,8 +57,11 @@ void exportDisks(ToolContext& context, MetricPage& page) {
       page.gauge({"tavrel_disk_capacity_bytes", "bytes", "Capacity of drives."}, name,
                  *reading.capacity);
     }
-    page.gauge({"tavrel_disk_reading_timestamp_seconds", "seconds", "When drives were last read."},
-               name, reading.time);
+    if (disk.age) {
+      page.gauge(
+          {"tavrel_disk_reading_timestamp_seconds", "seconds", "When drives were last read."}, name,
+          reading.time);
+    }
     exportFigures(disk, reading.figures, "", page);
     exportFigures(disk, reading.growth, "_growth", page);
   }

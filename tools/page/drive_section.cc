@@ -25,20 +25,6 @@ std::optional<std::int64_t> figureOf(const Disk& disk, std::string_view name) {
   return value ? std::optional(*value) : std::nullopt;
 }
 
-struct Wear {
-  std::string_view figure;
-  std::int64_t percent = 0;
-};
-
-std::optional<Wear> wearOf(const Disk& disk) {
-  std::optional<Wear> wear;
-  for (const std::string_view name : {"used_pct", "life_a_pct", "life_b_pct"}) {
-    const auto percent = figureOf(disk, name);
-    if (percent && (!wear || *percent > wear->percent)) wear = Wear{name, *percent};
-  }
-  return wear;
-}
-
 /// Days until the drive is worn out if wear continues at the same pace.
 std::optional<double> daysLeft(double percentUsed, double inDays, double percentNow) {
   if (percentUsed <= 0 || inDays <= 0) return std::nullopt;
@@ -142,7 +128,7 @@ void writeDrive(const PageScene& scene, page::HtmlWriter& html, const Disk& disk
   if (!reading.firmware.empty()) writeFact(html, "Firmware", reading.firmware);
   if (reading.capacity)
     writeFact(html, "Capacity", sizeText(static_cast<double>(*reading.capacity)));
-  writeFact(html, "Read", ageText(disk.age) + " ago");
+  if (disk.age) writeFact(html, "Read", ageText(*disk.age) + " ago");
   writeFact(html, "Life left", lifetimeText(scene, disk));
   html.end();
   if (const auto wear = wearOf(disk)) {
