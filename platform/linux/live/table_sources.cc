@@ -219,11 +219,14 @@ void addMemory(const DeviceRoot& root, LiveSource& source) {
 void addPressure(const DeviceRoot& root, LiveSource& source) {
   for (const std::string_view resource : kResources) {
     const std::string name(resource);
+    std::span<const Figure> figures = kPressure;
+    // The kernel does not define when all tasks of the system wait for a processor, and writes 0.
+    if (resource == "cpu") figures = figures.first(1);
     addFigures(root.path("/proc/pressure/" + name),
                {.group = "Pressure",
                 .subGroup = resource,
                 .prefix = name + '.',
-                .figures = kPressure,
+                .figures = figures,
                 .form = kPressureForm},
                source);
   }
