@@ -84,12 +84,21 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
     lines += "scalar\tyesterday\tcom.example." + std::string(60, '"') + std::to_string(i) + "\t1\n";
   for (int i = 0; i < 150; ++i)
     lines += "value\tyesterday\tcom.example.d" + std::to_string(i) + "\t1\t2\n";
+  std::string bounds;
+  for (int i = 1; i <= 70; ++i) {
+    bounds += format("%d, ", i);
+    for (int n = 0; n < (i > 7 ? 2 : 1); ++n)
+      lines += format("value\tyesterday\tcom.example.d0\t%d\t%d\n", i + 100 * n, i);
+  }
   import(lines);
+  device.write(kWhitelistFile, xmlOf(R"({"Usage": {"DistributionKeys": {"com.example.d0": {
+      "intervals": [)" + bounds + "71]}}}}"));
   const std::string size = device.run("page --days 400 -o -").out;
   EXPECT_LT(size.size(), 2'000'000U);
   const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
   const std::string text = textOf("--days 400");
-  expectIn(text, {"Not shown for lack of space: 50 distributions; " + day + " has them all",
+  expectIn(text, {"(1, 2] 2 (7, 8] 2", "(69, 70] 2 6 more intervals 6 ",
+                  "Not shown for lack of space: 50 distributions; " + day + " has them all",
                   "1330 statistics more without a chart"});
   EXPECT_EQ(countOf(text, "lack of space: (\\d+) (scalars|statistics);"), 2);
 }

@@ -1,5 +1,8 @@
 // The statistics of the day, both exact and as they leave the device.
 #include <algorithm>
+#include <functional>
+#include <numeric>
+#include <span>
 
 #include "base/format.h"
 #include "base/text.h"
@@ -19,6 +22,8 @@ using page::shortNumber;
 
 constexpr SectionLimit kScalarLimit{1000, 350'000};
 constexpr SectionLimit kDistributionLimit{100, 350'000};
+// Intervals of the log shown per distribution; the others are summed up.
+constexpr std::size_t kIntervals = 64;
 
 // The text for the log's column, whatever the type of the value.
 std::string coarseText(const plist::Value& value) {
@@ -117,6 +122,29 @@ void writeDayHistogram(page::HtmlWriter& html, std::string_view key, const DayVa
   writeHistogram(html, histogram);
 }
 
+// The fullest intervals in their order, and all others as one.
+std::vector<page::Bar> barsOf(const std::vector<DistributionView::Bucket>& buckets) {
+  std::vector<std::size_t> order(buckets.size());
+  std::iota(order.begin(), order.end(), std::size_t{0});
+  std::ranges::stable_sort(order, std::greater(), [&](std::size_t i) { return buckets[i].count; });
+  const std::size_t shown = std::min(order.size(), kIntervals);
+  std::ranges::sort(std::span(order).first(shown));
+  std::vector<page::Bar> bars;
+  double rest = 0;
+  for (std::size_t i = 0; i < order.size(); ++i) {
+    const auto& bucket = buckets[order[i]];
+    const auto count = static_cast<double>(bucket.count);
+    if (i < shown) {
+      bars.push_back({bucket.label, count, shortNumber(count)});
+    } else {
+      rest += count;
+    }
+  }
+  if (shown < order.size())
+    bars.push_back({format("%zu more intervals", order.size() - shown), rest, shortNumber(rest)});
+  return bars;
+}
+
 void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) {
   html.begin("p", {{"class", "note leaves"}});
   if (leaving == nullptr) {
@@ -128,11 +156,7 @@ void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) 
                 ? "In the log: count, range, mean and deviation"
                 : "In the log: count, range, mean and deviation, and how many values are in");
   html.end();
-  std::vector<page::Bar> bars;
-  for (const auto& bucket : leaving->buckets) {
-    const auto count = static_cast<double>(bucket.count);
-    bars.push_back({bucket.label, count, shortNumber(count)});
-  }
+  const std::vector<page::Bar> bars = barsOf(leaving->buckets);
   if (!bars.empty()) writeBars(html, format("Intervals of %s", leaving->key), bars);
 }
 
