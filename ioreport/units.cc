@@ -1,6 +1,7 @@
 #include "ioreport/units.h"
 
 #include <algorithm>
+#include <cmath>
 #include <limits>
 #include <span>
 
@@ -106,6 +107,19 @@ KernelReturn getFactorsFromScale(std::uint32_t factorWord, std::uint32_t scale,
   numerator = up;
   denominator = down;
   return kKernelSuccess;
+}
+
+bool hasExactFactors(std::uint64_t unit) {
+  const auto factor = factorsOf(factorWordOf(unit));
+  if (!factor || !factorsOf(unit)) return false;
+  const int tens = exponentOf(scaleOf(unit) & 0xFF);
+  const int twos = exponentOf(scaleOf(unit) >> 8 & 0xFF);
+  // Floating point does not wrap.
+  const auto powers = [](int ten, int two) {
+    return std::pow(10.0, std::max(ten, 0)) * std::exp2(std::max(two, 0));
+  };
+  return factor->numerator * powers(tens, twos) < 0x1p64 &&
+         factor->denominator * powers(-tens, -twos) < 0x1p64;
 }
 
 double IOReportScaleValue(std::uint64_t value, std::uint64_t fromUnit, std::uint64_t toUnit) {

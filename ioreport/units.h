@@ -33,6 +33,9 @@ std::optional<std::string_view> IOReportChannelGetUnitLabel(const plist::Diction
 KernelReturn getFactorsFromScale(std::uint32_t factorWord, std::uint32_t scale,
                                  std::uint64_t& numerator, std::uint64_t& denominator);
 
+/// Whether the factors of a unit are right: not those of a special scale, and without wrapping.
+bool hasExactFactors(std::uint64_t unit);
+
 /// Not-a-number when the units differ in quantity or one cannot be converted.
 double IOReportScaleValue(std::uint64_t value, std::uint64_t fromUnit, std::uint64_t toUnit);
 

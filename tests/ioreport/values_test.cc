@@ -228,6 +228,19 @@ TEST(UnitTest, ScalesValuesOfOneQuantity) {
   EXPECT_TRUE(std::isnan(IOReportScaleValue(1, kSeconds, unit(8, 0))));
   EXPECT_TRUE(std::isnan(IOReportScaleValue(1, unit(1, 0x10000), kSeconds)));
   EXPECT_TRUE(std::isnan(IOReportScaleValue(1, kSeconds, unit(1, 0x20000))));
+  const std::tuple<std::uint64_t, std::uint64_t, bool> cases[] = {
+      {0x7C, 0, true},
+      {127 + 19, 0, true},
+      {127 + 20, 0, false},
+      {127 - 20, 0, false},
+      {(127 + 63) << 8, 0, true},
+      {(127 + 60) << 8, 0x10, false},
+      {(127 - 60) << 8, 0x10, true},
+      {(127 - 60) << 8, 0x80000010, false},
+      {(127 + 8) << 8 | (127 + 18), 0, false},
+      {0x10000, 0, false}};
+  for (const auto& [scale, word, exact] : cases)
+    EXPECT_EQ(hasExactFactors(unit(1, scale, word)), exact) << scale << ' ' << word;
 }
 
 TEST(DescriptionTest, DescribesChannels) {

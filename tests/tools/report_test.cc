@@ -136,23 +136,24 @@ plist::Data element(std::initializer_list<std::uint64_t> words) {
 }
 
 TEST_F(ReportTest, ShowsValuesAtTheEndsOfTheirRange) {
-  // A state's counters run backwards, past the 64-bit limit.
+  // A state's counters run backwards, past the 64-bit limit, in units of 2^-100 s.
   Array groups = Array::create();
   for (const std::uint64_t count : {std::uint64_t{5}, ~std::uint64_t{0}})
     groups.append(element({7, 8, 0x100000002, 0, 1, count, count}));
   const Dictionary recorded = parseJsonValue(R"({
       "Services": [{"Class": "A\u001b", "EntryID": 7, "Properties": {
-        "IOReportLegendPublic": true, "IOReportLegend": [{"IOReportChannels": [[8, 4294967298]]}]}}],
+        "IOReportLegendPublic": true, "IOReportLegend": [{"IOReportChannels": [[8, 4294967298]],
+          "IOReportChannelInfo": {"IOReportChannelUnit": 72087280851877888}}]}}],
       "Hub": {"Channels": [{"DriverID": 7, "ChannelID": 8}]}})")
                                   ->dictionary();
   recorded.dictionary("Hub").array("Channels").at(0).dictionary().set("Elements", groups);
   play(recorded);
-  device.check(
-      "report sample --count 2 --interval 0",
-      prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  " + std::string(46, '#') +
-             "  5  entered 5\n\n"
-             "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8\n    0x1  100.0 %  ########  "
-             "18446744073709551615  entered 18446744073709551615\n"));
+  device.check("report sample --count 2 --interval 0",
+               prints("Sample 1 of 2\nA\\x1b <id 0x7>\n  0x8 (s)\n    0x1  100.0 %  " +
+                      std::string(46, '#') +
+                      "  5  entered 5\n\n"
+                      "Sample 2 of 2\nA\\x1b <id 0x7>\n  0x8 (s)\n    0x1  100.0 %  ########  "
+                      "18446744073709551615  entered 18446744073709551615\n"));
   const auto json = device.json("report sample --delta --interval 0");
   EXPECT_EQ(json["channels"][0]["states"], R"([{"id": 1, "name": null, "in_transitions": -6,
       "residency": -6, "converted": null, "duty_cycle": null, "current": false}])"_json);

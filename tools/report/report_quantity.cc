@@ -1,7 +1,5 @@
 #include "tools/report/report_quantity.h"
 
-#include <cmath>
-
 #include "base/quantity_text.h"
 #include "ioreport/ioreport.h"
 
@@ -38,12 +36,12 @@ std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, s
   const std::int64_t unit = IOReportChannelGetUnit(channel);
   if (value == kInvalidValue || unit == kInvalidValue) return std::nullopt;
   const auto word = static_cast<std::uint64_t>(unit);
+  if (!hasExactFactors(word)) return std::nullopt;
   const auto magnitude =
       value < 0 ? 0 - static_cast<std::uint64_t>(value) : static_cast<std::uint64_t>(value);
   for (const PlainUnit& plain : kPlainUnits) {
     if (word >> 56 != plain.unit >> 56) continue;
     const double converted = IOReportScaleValue(magnitude, word, plain.unit);
-    if (std::isnan(converted)) return std::nullopt;
     return ConvertedValue{value < 0 ? -converted : converted, plain.name};
   }
   return std::nullopt;
