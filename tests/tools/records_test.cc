@@ -31,8 +31,8 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
                                                       std::string(5000, '[') + "\n\0\0\0\n"s +
                                                       R"({"time":"x","type":172,"record":{"a":)");
   device.write(kRecords + "176-2026-11-27.jsonl", kTelemetryLine + "\n");
-  device.write(kRecords + "176-2026-11-02.jsonl",
-               recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}"));
+  device.write(kRecords + "176-2026-11-02.jsonl",  // from an editor
+               "\xEF\xBB\xBF" + recordLine("03:00:00.000Z", 176, "{\"Factory Count\":7}"));
   device.write(kRecords + "notes.txt", kEccLine);
   device.write(kRecords + "4294967296-2026-11-27.jsonl", kEccLine);
 
@@ -41,7 +41,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
       "172-2026-11-27.jsonl left out, torn by a kill or a power cut; the first is line 5\n";
   device.check("records list", (Outcome{1,
                                         "TYPE  DAY                 RECORDS       SIZE\n"
-                                        " 176  20759 (2026-11-02)        1   76 bytes\n"
+                                        " 176  20759 (2026-11-02)        1   79 bytes\n"
                                         " 172  20784 (2026-11-27)        4    5.0 KiB\n"
                                         " 176  20784 (2026-11-27)        1  104 bytes\n",
                                         torn}));
@@ -62,6 +62,7 @@ TEST(Records, ListsFilesAndShowsTheirRecordsByTime) {
             "2026-11-27T18:02:17.000Z  176  RD=1 s=[7,8] s[3…\n");
   EXPECT_EQ(device.json("records show --type 172", "", 1)["records"][0].dump(),
             nlohmann::json::parse(kEccLine).dump());
+  EXPECT_EQ(device.json("records show --day 2026-11-02")["records"].size(), 1U);
   EXPECT_EQ(device.run("records show --day soon").status, 2);
 
   std::filesystem::remove(device.path(kRecords) + "172-2026-11-27.jsonl");

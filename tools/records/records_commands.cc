@@ -144,6 +144,9 @@ class RecordsView {
     auto [reader, isNew] = readers_.try_emplace(file.path, file.path);
     const Status read =
         reader->second.read(!follows_, [&](std::string_view line, std::uint64_t number) {
+          // Editors begin a file with it, and no JSON document may contain it.
+          constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
+          if (line.starts_with(kByteOrderMark)) line.remove_prefix(kByteOrderMark.size());
           if (line.empty()) return;
           const auto record = parseRecord(line);
           if (!record) {
