@@ -289,6 +289,19 @@ TEST(NandSnapshot, PrintsTheWholeTextOrNothing) {
   device.check("nand snapshot - --descriptor " + device.path("/acting"),
                prints("%s\n\t\\x1b[2J7\\xc2\\x9b\n"), words({7, 0}));
 
+  // Without a stride, all records are the same one.
+  for (const auto& [count, text] : {std::pair(3U, std::string("8\n8\n8\n")), {~0U, ""}}) {
+    std::string descriptorOfOne = descriptor(count, "%u");
+    descriptorOfOne[8] = 0;
+    device.write("/one", descriptorOfOne);
+    const CommandLine repeated = "nand snapshot - --descriptor " + device.path("/one");
+    device.check(repeated, prints("%s\n"), words({0}));
+    if (!text.empty()) device.check(repeated, prints("%s\n" + text), words({8}));
+  }
+  EXPECT_EQ(device.run("nand snapshot - --descriptor " + device.path("/one"), words({8})),
+            fails("cannot render " + device.path("/one") +
+                  ": the text is longer than 335544320 bytes: render fewer records"));
+
   EXPECT_EQ(device.run("nand snapshot -", std::string(100, 'x')),
             fails("standard input has no complete record: it has 100 bytes, and a record has 252: "
                   "give a timeline of the controller, and --descriptor if one came with it"));

@@ -4,6 +4,7 @@
 
 #include "base/format.h"
 #include "storage/parse/snapshot_descriptor.h"
+#include "storage/parse/snapshot_record.h"
 #include "storage/parse/snapshot_text.h"
 
 namespace tavrel {
@@ -28,14 +29,11 @@ class Taken final : public StackSnapshot {
   ByteSpan bytes_;
 };
 
-}  // namespace
+Error tooLong() {
+  return Error{format("the text is longer than %zu bytes: render fewer records", kLongestText)};
+}
 
-Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor) {
-  // The renderer does not distinguish a refused descriptor from a text that does not fit.
-  if (descriptor) {
-    const auto checked = readSnapshotDescriptor(*descriptor, records.size());
-    if (!checked) return checked.error();
-  }
+Expected<std::string> render(ByteSpan records, std::optional<ByteSpan> descriptor) {
   std::string text;
   std::size_t capacity = 0;
   while (capacity < kLongestText) {
@@ -52,7 +50,37 @@ Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> 
       return text;
     }
   }
-  return Error{format("the text is longer than %zu bytes: render fewer records", kLongestText)};
+  return tooLong();
+}
+
+// Without a stride all records are the same one, and no buffer bounds their number.
+Expected<std::string> renderRepeated(ByteSpan record, std::string_view descriptor,
+                                     const SnapshotDescriptor& layout) {
+  constexpr std::size_t kCountOffset = 12;
+  constexpr std::string_view kOne("\1\0\0\0", 4);
+  const std::string single = std::string(descriptor).replace(kCountOffset, kOne.size(), kOne);
+  auto text = render(record, asBytes(single));
+  if (!text) return text;
+  const std::string_view key = layout.key.value_or(kSnapshotColumnKey);
+  const std::string line = text->substr(key.size());
+  const std::uint64_t length = key.size() + std::uint64_t{layout.count} * line.size();
+  if (length >= kLongestText) return tooLong();
+  text->reserve(length);
+  for (std::size_t more = 1; !line.empty() && more < layout.count; ++more)
+    *text += line;
+  return text;
+}
+
+}  // namespace
+
+Expected<std::string> renderSnapshots(ByteSpan records, std::optional<ByteSpan> descriptor) {
+  if (!descriptor) return render(records, descriptor);
+  // The renderer does not distinguish a refused descriptor from a text that does not fit.
+  const auto checked = readSnapshotDescriptor(*descriptor, records.size());
+  if (!checked) return checked.error();
+  if (checked->stride == 0 && checked->count > 1)
+    return renderRepeated(records, asText(*descriptor), *checked);
+  return render(records, descriptor);
 }
 
 std::unique_ptr<StackSnapshot> TakenSnapshot::create() {
