@@ -160,8 +160,8 @@ TEST(Nandlog, ShowsTheNewestLogAndWhenTheNextMayBeWritten) {
   };
   file("6T18", "165",
        "System ID: 1-2\nOS Version: A: b\n\n2026-11-16 18:02:18 +0000 a b[211]: "
-       "UserWamp:2.05;com.norvane.NANDInfo.x:7;odd:key:1;ValidityList[0]:12,-1;IntermediateWamp:"
-       "inf\n");
+       "UserWamp:2.05;com.norvane.NANDInfo.x:7;odd:key:99999999999999999999;ValidityList[0]:12,-1;"
+       "IntermediateWamp:inf\n");
   file("6T17", "165", "older");
   file("7T18", "193", "other");
   device.run("prefs set com.norvane.zentrix.tavrel SSLastLoggedAt 2026-01-01T00:00:00Z --date");
@@ -182,7 +182,7 @@ Valid pages by bucket (1)
   ValidityList[0]  12,-1
 
 Others (1)
-  odd:key  1
+  odd:key  99999999999999999999
 
 Next log        the next run may write one; the last was written 2026-01-01 00:00:00 +0000
 )"));
@@ -192,6 +192,9 @@ Next log        the next run may write one; the last was written 2026-01-01 00:0
       "last_logged": "2200-01-01T00:00:00Z", "last_is_in_future": true, "allowed_now": false,
       "allowed_from": "2200-01-08T00:00:00Z"})"_json);
   EXPECT_EQ(document["log"]["date"], "2026-11-16 18:02:18 +0000");
+  EXPECT_EQ(document["log"]["write_amplification"],
+            R"({"UserWamp": 2.05, "IntermediateWamp": {"$real": "inf"}})"_json);
+  EXPECT_EQ(document["log"]["others"]["odd:key"], "99999999999999999999");
   EXPECT_EQ(document["log"]["validity"], R"({"ValidityList[0]": [12, -1]})"_json);
   // A log without metadata is recognised by its name.
   const std::string named = outbox + "StorageStatus-9.log";

@@ -1,6 +1,7 @@
 #include "tools/log/nandlog_commands.h"
 
 #include <algorithm>
+#include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <utility>
@@ -138,10 +139,12 @@ Json jsonOf(const NextLog& next) {
           {"allowed_from", next.from ? Json(isoDateText(*next.from)) : Json(nullptr)}};
 }
 
-/// A number when the text is one, otherwise the text itself.
+/// A number when the text is one, otherwise the text itself, as for an integer beyond 64 bits.
 Json jsonOfNumber(std::string_view text) {
-  Json number = Json::parse(text, nullptr, false);
-  return number.is_number() ? number : Json(text);
+  for (const double special : {HUGE_VAL, -HUGE_VAL, std::nan("")})
+    if (text == numberText(special)) return tavrel::jsonOf(plist::Value(special));
+  const auto value = parseJsonValue(text);
+  return value && value->number() ? tavrel::jsonOf(*value) : Json(text);
 }
 
 Json jsonOfItem(const Group& group, std::string_view text) {
