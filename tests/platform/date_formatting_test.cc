@@ -40,14 +40,17 @@ TEST(DateFormatting, PrintsTheTimeOfTheDevicesZone) {
       {nullptr, NAN, "1970-01-01 00:00:00 +0000", kPattern},
       {nullptr, 1e300, "292277026596 QQ'yyyMMM%d", "yyyy QQ'yyyMMM%d"},
       {nullptr, -1e300, "292277022658", "yyyy"}};
+  const std::filesystem::path folder = std::filesystem::current_path();
   for (const auto& [rule, instant, text, pattern] : kCases) {
     const TemporaryRoot device;  // a separate file for each zone
     device.write("/etc/localtime", rule ? zoneFile(rule) : "no zone file");
-    const DeviceRoot relative(std::filesystem::relative(device.root.path("/")));
+    const DeviceRoot relative(".");
+    std::filesystem::current_path(device.root.path("/"));
     for (const DeviceRoot* root : {&device.root, &relative}) {
       LinuxDateFormatting formatting(*root);
       EXPECT_EQ(formatting.format(plist::Date::since1970(instant), pattern, "en_US_POSIX"), text);
     }
+    std::filesystem::current_path(folder);
   }
 }
 
