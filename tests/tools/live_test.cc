@@ -97,10 +97,11 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
       {{{"/proc/pressure/io",
          "some avg10=0.00 avg60=1.00 avg300=0.00 total=77\nfull avg10=0.00 avg60=0.00 "
          "avg300=0.00 total=5\n"},
+        {"/proc/pressure/irq", "full avg10=0.00 avg60=0.00 avg300=0.00 total=9\n"},
         {"/proc/pressure/cpu",
          "some avg10=0.00 avg60=1.00 avg300=0.00 total=7\nfull avg10=0.00 avg60=0.00 "
          "avg300=0.00 total=0\n"}},
-       "cpu.pressure_some=7 io.pressure_some=77 io.pressure_full=5 "},
+       "cpu.pressure_some=7 io.pressure_some=77 io.pressure_full=5 irq.pressure_full=9 "},
       {{{"/proc/schedstat", "version 15\ntimestamp 1\ncpu1 0 0 0 0 0 0 11 22 33\ndomain0 3 9\n"}},
        "cpu1.sched_run=11 cpu1.sched_wait=22 cpu1.sched_slices=33 "},
       {{{"/proc/vmstat", "nr_free_pages 9\npswpin 3\npgpgin 2\noom_kill 1\nother x\n"}},

@@ -134,7 +134,9 @@ void addControlGroups(const DeviceRoot& root, LiveSource& source) {
     addIo(slice.path + "/io.stat", slice, disks, source);
     for (const char* const resource : {"cpu", "memory", "io", "irq"}) {
       const std::string name(resource);
-      add(name + ".pressure", kPressure, prefix + name + '_', kPressureForm);
+      const std::span<const Figure> figures(kPressure);
+      add(name + ".pressure", name == "irq" ? figures.last(1) : figures, prefix + name + '_',
+          kPressureForm);
     }
     addAttributes(slice.path, {group, slice.name, kPlain}, prefix, kAttributes, Speed::Quick,
                   source);
