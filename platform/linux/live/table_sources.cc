@@ -220,8 +220,8 @@ void addPressure(const DeviceRoot& root, LiveSource& source) {
   for (const std::string_view resource : kResources) {
     const std::string name(resource);
     std::span<const Figure> figures = kPressure;
-    // The kernel does not define when all tasks of the system wait for a processor, and writes 0. It
-    // does not count when some wait for the end of interrupts.
+    // The kernel does not define when all tasks of the system wait for a processor, and writes 0.
+    // It does not count when some wait for the end of interrupts.
     if (resource == "cpu") figures = figures.first(1);
     if (resource == "irq") figures = figures.last(1);
     addFigures(root.path("/proc/pressure/" + name),
