@@ -3,7 +3,7 @@
 #include <string>
 #include <string_view>
 
-#include "base/arithmetic.h"
+#include "base/instant.h"
 #include "base/program.h"
 #include "base/version.h"
 #include "platform/guarded.h"
@@ -44,7 +44,7 @@ int readDrives(SystemLog& log) {
   FileSystem files;
   health::LinuxDeviceCommands commands;
   health::HealthReader reader(root, files, commands, log);
-  return reader.readAll(saturatingInt64(LinuxClock().now().secondsSince1970())) ? 0 : 1;
+  return reader.readAll(wholeSeconds(LinuxClock().now())) ? 0 : 1;
 }
 
 }  // namespace

@@ -5,6 +5,7 @@
 
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/instant.h"
 #include "fleet/logs/five_numbers_check.h"
 #include "fleet/logs/interval_label.h"
 #include "fleet/logs/limits.h"
@@ -45,10 +46,6 @@ std::string_view shown(std::string_view text) {
 
 bool isUnknown(std::string_view text) {
   return text == "<unknown>" || text == "(no tasking id)";
-}
-
-std::int64_t wholeSeconds(plist::Date date) {
-  return static_cast<std::int64_t>(std::floor(date.secondsSince1970()));
 }
 
 bool isInCalendar(plist::Date date) {

@@ -5,6 +5,7 @@
 #include <sys/un.h>
 #include <sys/utsname.h>
 
+#include "base/instant.h"
 #include "base/program.h"
 #include "device_services.h"
 #include "platform/guarded.h"

@@ -6,6 +6,7 @@
 #include "base/iso_date.h"
 #include "device.h"
 #include "platform/linux/runs/last_run.h"
+#include "platform/plist/binary.h"
 #include "tools/check/read_only.h"
 
 namespace tavrel {
@@ -112,6 +113,12 @@ TEST_F(CheckTest, TellsHowTheLastRunsWent) {
   expect("CRITICAL " + run + " finished", 2);
   writeRun(kHour, true, 2);
   expect("WARNING " + run + " finished, begun 5 h ago; 2 errors: cannot do 0; cannot do 1\n", 1);
+  const auto before1970 = plist::Date::since1970(-0.5);
+  const plist::Dictionary old{{"Time", before1970}, {"LastFinished", before1970}};
+  device.write(kLastRunFile, *plist::writeBinary(old));
+  EXPECT_EQ(
+      device.json("status --check", {}, 2)["checks"][2]["figures"]["finished_timestamp_seconds"],
+      -1);
 }
 
 TEST_F(CheckTest, JudgesPreferencesAndTheClock) {

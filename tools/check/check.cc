@@ -5,6 +5,7 @@
 #include <ostream>
 
 #include "base/arithmetic.h"
+#include "base/instant.h"
 #include "platform/platform.h"
 #include "tools/check/checks.h"
 #include "tools/shared/table.h"
@@ -35,12 +36,8 @@ CheckState stateOfAge(std::int64_t seconds) {
   return seconds >= kWarningAge ? CheckState::Warning : CheckState::Ok;
 }
 
-std::int64_t secondsOf(plist::Date date) {
-  return saturatingInt64(date.secondsSince1970());
-}
-
 std::int64_t CheckScene::ageOf(plist::Date date) const {
-  return ageOf(secondsOf(date));
+  return ageOf(wholeSeconds(date));
 }
 
 void addFinding(Check& check, CheckState state, std::string_view text) {
@@ -55,7 +52,7 @@ void addFinding(Check& check, CheckState state, std::string_view text) {
 std::vector<Check> checkDevice(ToolContext& context, std::chrono::milliseconds examination) {
   std::vector<Check> checks;
   Platform& platform = context.platform();
-  CheckScene scene{context, secondsOf(platform.clock->now()),
+  CheckScene scene{context, wholeSeconds(platform.clock->now()),
                    platform.statistics->BHDaysSince1970(), examination, checks};
   for (const auto check : {checkPermission, checkClock, checkLastRun, checkLastLog, checkStore,
                            checkRecording, checkQueues, checkUpload, checkDisks}) {

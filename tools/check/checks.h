@@ -21,8 +21,6 @@ struct CheckScene {
   std::int64_t ageOf(plist::Date date) const;
 };
 
-std::int64_t secondsOf(plist::Date date);
-
 /// Makes a check at least as grave as `state` and extends its text, which stays on one line.
 void addFinding(Check& check, CheckState state, std::string_view text);
 

@@ -1,5 +1,6 @@
 // Logs that are waiting, and failures of the uploader.
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/limits.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
@@ -75,7 +76,7 @@ void judgeUpload(CheckScene& scene, const UploadState& state, Check& check) {
   check.figures = {{&kFailed, static_cast<double>(state.failedAttempts)},
                    {&kSent, static_cast<double>(state.sent)},
                    {&kRefused, static_cast<double>(state.refused)}};
-  if (success) check.figures.push_back({&kSuccess, static_cast<double>(secondsOf(*success))});
+  if (success) check.figures.push_back({&kSuccess, static_cast<double>(wholeSeconds(*success))});
   check.text =
       success ? format("a log was last sent %s ago", ageText(scene.ageOf(*success))) : "never sent";
   if (state.failedAttempts == 0) return;

@@ -1,6 +1,7 @@
 // Permission, clock, and the last run with its log.
 #include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/quantity_text.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
@@ -30,7 +31,7 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
   Check check{"last-run"};
   if (run.lastFinished) {
     check.state = stateOfAge(scene.ageOf(*run.lastFinished));
-    check.figures.push_back({&kRunTime, static_cast<double>(secondsOf(*run.lastFinished))});
+    check.figures.push_back({&kRunTime, static_cast<double>(wholeSeconds(*run.lastFinished))});
   }
   check.figures.push_back({&kRunErrors, static_cast<double>(run.errorCount)});
   const std::string age = ageText(scene.ageOf(run.began));

@@ -4,7 +4,7 @@
 #include <set>
 #include <string>
 
-#include "base/arithmetic.h"
+#include "base/instant.h"
 #include "platform/linux/files/boot_id.h"
 #include "platform/linux/health/drives.h"
 #include "platform/linux/health/reader.h"
@@ -16,7 +16,7 @@ using namespace health;
 
 DiskList findDisks(ToolContext& context) {
   auto [readings, faults] = loadReadings(context.root(), context.linuxPlatform().fileSystem());
-  const std::int64_t now = saturatingInt64(context.platform().clock->now().secondsSince1970());
+  const std::int64_t now = wholeSeconds(context.platform().clock->now());
   const std::string boot = bootIDOf(context.root());
   const auto drives = findDrives(Machine(context.root()));
   if (!drives) faults.push_back(drives.error());

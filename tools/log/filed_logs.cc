@@ -1,11 +1,11 @@
 #include "tools/log/filed_logs.h"
 
 #include <algorithm>
-#include <cmath>
 #include <functional>
 #include <tuple>
 
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/limits.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
@@ -17,9 +17,9 @@ namespace tavrel {
 namespace {
 
 // The second since 1970 in which a log was filed; a log without metadata counts as the oldest.
-double secondOf(const FiledLog& log) {
+std::optional<std::int64_t> secondOf(const FiledLog& log) {
   const auto time = log.metadata.date(kLogMetadataTime);
-  return time ? std::floor(time->secondsSince1970()) : -HUGE_VAL;
+  return time ? std::optional(wholeSeconds(*time)) : std::nullopt;
 }
 
 // The order in which logs were filed. Metadata gives the second, and the file's time refines it.
@@ -57,8 +57,8 @@ Expected<std::vector<FiledLog>> filesOfLogs(ToolContext& context, std::vector<Un
 }
 
 // The second in which a log was filed, from its name or else its metadata.
-double secondFiled(ToolContext& context, FiledLog& log) {
-  if (const auto known = parseLogFileName(log.name)) return static_cast<double>(known->seconds);
+std::optional<std::int64_t> secondFiled(ToolContext& context, FiledLog& log) {
+  if (const auto known = parseLogFileName(log.name)) return known->seconds;
   context.linuxPlatform().submission().readMetadata(log);
   return secondOf(log);
 }
@@ -93,7 +93,7 @@ Expected<FiledLogs> filedLogs(ToolContext& context, std::size_t most) {
   FiledLogs filed{*std::move(files), 0, std::move(unseen)};
   if (filed.logs.size() > most) {
     // Sorts positions rather than logs, which are costly to move.
-    std::vector<std::pair<double, std::size_t>> seconds;
+    std::vector<std::pair<std::optional<std::int64_t>, std::size_t>> seconds;
     seconds.reserve(filed.logs.size());
     for (FiledLog& log : filed.logs)
       seconds.emplace_back(secondFiled(context, log), seconds.size());
@@ -135,14 +135,14 @@ Expected<std::optional<FiledLog>> newestLog(ToolContext& context, std::string_vi
   FileSubmission& submission = context.linuxPlatform().submission();
   auto files = filesOfLogs(context, unseen);
   if (!files) return files.error();
-  std::vector<std::pair<double, FiledLog>> candidates;
+  std::vector<std::pair<std::optional<std::int64_t>, FiledLog>> candidates;
   for (FiledLog& log : *files) {
     const auto known = parseLogFileName(log.name);
     if (!known) submission.readMetadata(log);
     const std::string_view logName =
         known ? known->logName : log.metadata.string(kLogMetadataName).value_or(log.name);
     if (!logName.starts_with(namePrefix)) continue;
-    const double second = known ? static_cast<double>(known->seconds) : secondOf(log);
+    const auto second = known ? std::optional(known->seconds) : secondOf(log);
     candidates.emplace_back(second, std::move(log));
   }
   std::stable_sort(candidates.begin(), candidates.end(),

@@ -1,12 +1,11 @@
 #include "tools/log/log_list.h"
 
-#include <cmath>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <set>
 
-#include "base/civil_time.h"
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/limits.h"
 #include "base/quantity_text.h"
 #include "platform/linux/files/file_system.h"
@@ -52,9 +51,7 @@ std::optional<std::int32_t> readDay(ToolContext& context, const FiledLog& log,
 bool isSurelyForced(const FiledLog& log, std::optional<std::int32_t> day) {
   const auto filed = log.metadata.date(kLogMetadataTime);
   if (!day || !filed) return false;
-  const double filedDay =
-      std::floor(filed->secondsSince1970() / static_cast<double>(kSecondsPerDay));
-  return filedDay - 1 != static_cast<double>(*day);
+  return dayOf(*filed) - 1 != *day;
 }
 
 }  // namespace

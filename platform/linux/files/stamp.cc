@@ -1,16 +1,11 @@
 #include "platform/linux/files/stamp.h"
 
-#include <cmath>
-
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/instant.h"
 
 namespace tavrel {
-
-std::int64_t wholeSeconds(plist::Date instant) {
-  return saturatingInt64(std::floor(instant.secondsSince1970()));
-}
 
 std::string compactStamp(plist::Date instant) {
   const CivilTime time = civilFromSeconds(wholeSeconds(instant));
@@ -33,10 +28,6 @@ std::string preciseStamp(plist::Date instant) {
   const auto milliseconds = static_cast<unsigned>(saturatingInt64(fraction * 1000.0)) % 1000U;
   return format("%sT%02u:%02u:%02u.%03uZ", dateText(time.date), time.hour, time.minute, time.second,
                 milliseconds);
-}
-
-std::int64_t dayOf(plist::Date instant) {
-  return dayOfSecond(wholeSeconds(instant));
 }
 
 }  // namespace tavrel

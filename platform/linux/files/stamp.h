@@ -10,9 +10,6 @@
 
 namespace tavrel {
 
-/// Seconds since 1970-01-01 00:00:00 UTC, rounded down, saturated.
-std::int64_t wholeSeconds(plist::Date instant);
-
 /// "20261116T180218Z", for file names.
 std::string compactStamp(plist::Date instant);
 
@@ -21,8 +18,5 @@ std::optional<std::int64_t> dayInStamp(std::string_view stamp);
 
 /// "2026-11-16T18:02:18.123Z", milliseconds cut off.
 std::string preciseStamp(plist::Date instant);
-
-/// The UTC day of an instant, in days since 1970-01-01.
-std::int64_t dayOf(plist::Date instant);
 
 }  // namespace tavrel

@@ -2,8 +2,8 @@
 
 #include <algorithm>
 
-#include "base/arithmetic.h"
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/limits.h"
 #include "platform/plist/coding.h"
 #include "platform/plist/xml.h"
@@ -86,7 +86,7 @@ Expected<Reading> decodeReading(ByteSpan bytes) {
   reading.model = text("model");
   reading.firmware = text("firmware");
   if (const auto capacity = document.number("capacity")) reading.capacity = capacity->int64();
-  reading.time = std::max<std::int64_t>(saturatingInt64(time->secondsSince1970()), 0);
+  reading.time = std::max<std::int64_t>(wholeSeconds(*time), 0);
   reading.boot = text("boot");
   reading.from = text("from");
   reading.error = text("error");

@@ -9,7 +9,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
-#include "platform/linux/files/stamp.h"
+#include "base/instant.h"
 
 namespace tavrel {
 namespace {

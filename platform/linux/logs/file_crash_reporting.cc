@@ -6,6 +6,7 @@
 #include <set>
 #include <utility>
 
+#include "base/instant.h"
 #include "base/limits.h"
 #include "base/uuid.h"
 #include "platform/guarded.h"

@@ -9,7 +9,7 @@
 namespace tavrel {
 namespace {
 
-std::optional<std::int32_t> dayOf(plist::Date start) {
+std::optional<std::int32_t> dayIn32Bits(plist::Date start) {
   const double day = std::floor(start.secondsSince1970() / static_cast<double>(kSecondsPerDay));
   if (!(day >= -2147483648.0 && day <= 2147483647.0)) return std::nullopt;
   return static_cast<std::int32_t>(day);
@@ -25,14 +25,14 @@ std::optional<std::int32_t> dayInText(std::string_view text) {
   if (found == text.npos) return std::nullopt;
   text.remove_prefix(found + kBefore.size());
   const auto start = parseIsoInstant(text.substr(0, text.find('<')));
-  return start ? dayOf(*start) : std::nullopt;
+  return start ? dayIn32Bits(*start) : std::nullopt;
 }
 
 }  // namespace
 
 std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log) {
   const auto start = log.date("BHStartDate");
-  return start ? dayOf(*start) : std::nullopt;
+  return start ? dayIn32Bits(*start) : std::nullopt;
 }
 
 std::optional<std::int32_t> dayOfLog(std::string_view bytes, PropertyListCoding& propertyLists) {

@@ -8,6 +8,7 @@
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
 #include "base/format.h"
+#include "base/instant.h"
 #include "base/system_text.h"
 #include "platform/linux/files/file_opening.h"
 #include "platform/linux/files/file_system.h"

@@ -1,15 +1,13 @@
 #include "platform/linux/store/sqlite_store.h"
 
 #include <algorithm>
-#include <cmath>
 #include <filesystem>
 #include <limits>
 #include <optional>
 #include <system_error>
 #include <utility>
 
-#include "base/arithmetic.h"
-#include "base/civil_time.h"
+#include "base/instant.h"
 #include "platform/guarded.h"
 #include "platform/linux/store/damage_check.h"
 #include "platform/linux/store/sqlite_log_file.h"
@@ -34,9 +32,7 @@ SqliteStore::~SqliteStore() {
 std::int32_t SqliteStore::BHDaysSince1970() {
   constexpr std::int64_t kLast = std::numeric_limits<std::int32_t>::max();
   constexpr std::int64_t kFirst = std::numeric_limits<std::int32_t>::min();
-  const double days =
-      std::floor(site_.clock.now().secondsSince1970() / static_cast<double>(kSecondsPerDay));
-  return static_cast<std::int32_t>(std::clamp(saturatingInt64(days), kFirst, kLast));
+  return static_cast<std::int32_t>(std::clamp(dayOf(site_.clock.now()), kFirst, kLast));
 }
 
 plist::Date SqliteStore::dateForDaysSince1970(std::int32_t day) {
