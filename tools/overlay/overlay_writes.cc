@@ -138,14 +138,6 @@ void OverlaySubmission::deliverDeletion() {
   events_.deliver(OverlayEvent::Kind::CleanUp, "logs that wait without permission", waiting);
 }
 
-std::int32_t OverlayStore::BHDaysSince1970() {
-  return below_.BHDaysSince1970();
-}
-
-plist::Date OverlayStore::dateForDaysSince1970(std::int32_t day) {
-  return below_.dateForDaysSince1970(day);
-}
-
 bool OverlayStore::BHClientCheckpoint() {
   events_.deliver(OverlayEvent::Kind::Checkpoint, "the statistics store");
   return true;
@@ -156,7 +148,7 @@ void OverlayStore::BHClientSetValueForScalarKey(std::string_view key, std::int64
 }
 
 std::unique_ptr<BHHistory> OverlayStore::initWithDefaultPath() {
-  return std::make_unique<OverlayHistory>(below_.initWithDefaultPath(), events_);
+  return std::make_unique<OverlayHistory>(ForwardingStore::initWithDefaultPath(), events_);
 }
 
 void OverlayCrashReporting::FLLogStructuredData(std::uint32_t logType,

@@ -8,6 +8,7 @@
 #include <utility>
 #include <vector>
 
+#include "platform/forwarding_store.h"
 #include "platform/linux/logs/file_crash_reporting.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/platform.h"
@@ -87,19 +88,16 @@ class OverlaySubmission final : public SubmissionService {
   const OverlayEvents& events_;
 };
 
-class OverlayStore final : public StatisticsStore {
+class OverlayStore final : public ForwardingStore {
  public:
   OverlayStore(StatisticsStore& below, const OverlayEvents& events)
-      : below_(below), events_(events) {}
+      : ForwardingStore(below), events_(events) {}
 
-  std::int32_t BHDaysSince1970() override;
-  plist::Date dateForDaysSince1970(std::int32_t day) override;
   bool BHClientCheckpoint() override;
   void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override;
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
 
  private:
-  StatisticsStore& below_;
   const OverlayEvents& events_;
 };
 

@@ -3,39 +3,35 @@
 
 #include <memory>
 #include <string>
-#include <string_view>
 #include <vector>
 
+#include "platform/forwarding_store.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/folding/segment_folder.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/property_list_coding.h"
-#include "platform/statistics_store.h"
 #include "platform/system_log.h"
 
 namespace tavrel {
 
 /// Shows what `FoldingStore` shows after a checkpoint, and changes no segment. Its histories have
 /// the order of `BHHistory` only within each day.
-class UnfoldedStore final : public StatisticsStore {
+class UnfoldedStore final : public ForwardingStore {
  public:
   /// All must outlive it.
   UnfoldedStore(const DeviceRoot& root, SqliteStore& store, FileSystem& files,
                 PropertyListCoding& propertyLists, SystemLog& log)
-      : root_(root), store_(store), files_(files), propertyLists_(propertyLists), log_(log) {}
+      : ForwardingStore(store),
+        root_(root),
+        store_(store),
+        files_(files),
+        propertyLists_(propertyLists),
+        log_(log) {}
 
   /// Which waiting values the last history lacked, for people, in a line each.
   const std::vector<std::string>& missing() const { return missing_; }
 
-  std::int32_t BHDaysSince1970() override { return store_.BHDaysSince1970(); }
-  plist::Date dateForDaysSince1970(std::int32_t day) override {
-    return store_.dateForDaysSince1970(day);
-  }
-  bool BHClientCheckpoint() override { return store_.BHClientCheckpoint(); }
-  void BHClientSetValueForScalarKey(std::string_view key, std::int64_t value) override {
-    store_.BHClientSetValueForScalarKey(key, value);
-  }
   /// Must not outlive the store.
   std::unique_ptr<BHHistory> initWithDefaultPath() override;
 

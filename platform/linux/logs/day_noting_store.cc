@@ -37,7 +37,7 @@ class DayNotingStore::History final : public BHHistory {
 };
 
 std::unique_ptr<BHHistory> DayNotingStore::initWithDefaultPath() {
-  return std::make_unique<History>(store_.initWithDefaultPath(), earliest_);
+  return std::make_unique<History>(ForwardingStore::initWithDefaultPath(), earliest_);
 }
 
 }  // namespace tavrel
