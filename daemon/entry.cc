@@ -1,6 +1,5 @@
 #include "daemon/entry.h"
 
-#include <cstdint>
 #include <string_view>
 
 #include "base/arithmetic.h"
@@ -53,35 +52,52 @@ void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
   runDailyIfNeeded(platform, plist::Array());
 }
 
-void runArgument(Platform& platform, const char* argument) {
-  const std::int32_t today = platform.statistics->BHDaysSince1970();
-  const std::string_view mode = argument;
+void run(Platform& platform, RunKind kind, std::chrono::milliseconds idleSlice) {
   const plist::Array noAppInfo;
-  if (mode == "-d") {
-    runDailyIfNeeded(platform, noAppInfo);
-  } else if (mode == "-f") {
-    dailyTasksForDay(platform, previousDay(today), noAppInfo);
-  } else if (mode == "-t") {
-    dailyTasksForDay(platform, today, noAppInfo);
-  } else {
-    platform.log->log(LogLevel::Default, "Unknown arg: %s", argument);
-    if (mode == "-h" || mode == "--help") platform.standardStreams->writeOutput(kHelp);
-    if (mode == "--version") {
-      platform.standardStreams->writeOutput(format("tavrel %s\n", version()));
-    }
+  const auto today = [&] { return platform.statistics->BHDaysSince1970(); };
+  switch (kind) {
+    case RunKind::Daily:
+      runDailyIfNeeded(platform, noAppInfo);
+      break;
+    case RunKind::Forced:
+      dailyTasksForDay(platform, previousDay(today()), noAppInfo);
+      break;
+    case RunKind::Today:
+      dailyTasksForDay(platform, today(), noAppInfo);
+      break;
+    case RunKind::Service:
+      serve(platform, idleSlice);
+      break;
+  }
+}
+
+void answer(Platform& platform, std::string_view argument) {
+  platform.log->log(LogLevel::Default, "Unknown arg: %s", argument);
+  if (argument == "-h" || argument == "--help") platform.standardStreams->writeOutput(kHelp);
+  if (argument == "--version") {
+    platform.standardStreams->writeOutput(format("tavrel %s\n", version()));
   }
 }
 
 }  // namespace
 
+std::optional<RunKind> runKindOf(std::span<const char* const> arguments) {
+  if (arguments.size() == 1) return RunKind::Service;
+  const std::string_view argument = arguments.empty() ? "" : arguments[1];
+  if (argument == "-d") return RunKind::Daily;
+  if (argument == "-f") return RunKind::Forced;
+  if (argument == "-t") return RunKind::Today;
+  return std::nullopt;
+}
+
 int runTavrel(Platform& platform, std::span<const char* const> arguments,
               std::chrono::milliseconds idleSlice) {
   platform.log->log(LogLevel::Default, "tavrel started");
   runGuarded(platform.log, "finish the run", [&] {
-    if (arguments.size() == 1) {
-      serve(platform, idleSlice);
-    } else if (arguments.size() >= 2) {
-      runArgument(platform, arguments[1]);
+    if (const auto kind = runKindOf(arguments)) {
+      run(platform, *kind, idleSlice);
+    } else if (!arguments.empty()) {
+      answer(platform, arguments[1]);
     }
   });
   platform.log->log(LogLevel::Default, "tavrel ended");

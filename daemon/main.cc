@@ -5,7 +5,6 @@
 #include <exception>
 #include <fcntl.h>
 #include <span>
-#include <string_view>
 #include <sys/stat.h>
 #include <thread>
 #include <unistd.h>
@@ -39,13 +38,6 @@ void tellEnd(const std::exception& error) {
   }
 }
 
-std::string_view taskOf(int argc, char** argv) {
-  const std::string_view mode = argc > 1 ? argv[1] : "";
-  if (mode == "-f") return "forced";
-  if (mode == "-t") return "today";
-  return mode.empty() ? "service" : "daily";
-}
-
 /// How long a service that cannot work waits before it ends, as in tavrel.service after a failed
 /// start.
 constexpr std::chrono::seconds kPauseOfService{30};
@@ -57,7 +49,7 @@ void pauseIfActivated() {
 }
 
 /// False when the run could not begin or was cut short.
-bool run(int argc, char** argv) {
+bool run(std::span<const char* const> arguments) {
   using namespace tavrel;
   try {
     DeviceRoot root = DeviceRoot::fromEnvironment();
@@ -67,13 +59,12 @@ bool run(int argc, char** argv) {
     }
     LinuxSystemLog systemLog;
     LinuxClock clock;
-    RunMemory memory(root, clock, systemLog, taskOf(argc, argv));
+    RunMemory memory(root, clock, systemLog, runKindOf(arguments));
     bool isWhole = false;
     try {
       // Inside the try block, because its destructor writes the run's changes, which may fail too.
       LinuxPlatform linuxPlatform(std::move(root), {.log = &memory});
-      runTavrel(linuxPlatform.platform(),
-                std::span<const char* const>(argv, static_cast<std::size_t>(argc)));
+      runTavrel(linuxPlatform.platform(), arguments);
       isWhole = true;
     } catch (const std::exception& error) {
       memory.log(LogLevel::Error, "run ended early: %s", error.what());
@@ -93,6 +84,6 @@ bool run(int argc, char** argv) {
 int main(int argc, char** argv) {
   umask(022);  // the modes of files must not depend on who starts a run
   secureStandardStreams();
-  if (!run(argc, argv)) pauseIfActivated();
+  if (!run({argv, static_cast<std::size_t>(argc)})) pauseIfActivated();
   return 0;
 }

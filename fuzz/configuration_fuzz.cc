@@ -117,7 +117,7 @@ void readMemory(Device& device) {
     require((*run)->errors.size() <= LastRun::kErrors);
     if ((*run)->write(device.root, device.files)) {
       const auto again = LastRun::read(device.root, device.files);
-      require(again && *again && (*again)->task == (*run)->task &&
+      require(again && *again && (*again)->kind == (*run)->kind &&
               (*again)->errors == (*run)->errors && (*again)->day == (*run)->day);
     }
   }

@@ -1,6 +1,7 @@
 #include "daemon/daily_run.h"
 
 #include <algorithm>
+#include <array>
 #include <gtest/gtest.h>
 
 #include "base/version.h"
@@ -196,6 +197,7 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   for (const char* help : {"-h", "--help"}) {
     run({"tavrel", help});
     EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + help);
+    EXPECT_FALSE(runKindOf(std::array{"tavrel", help}));
     EXPECT_TRUE(
         fake.streams.output.starts_with("Usage: tavrel [-d | -f | -t | -h | --version]\n\n"));
     fake.streams.output.clear();

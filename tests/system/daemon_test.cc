@@ -184,7 +184,7 @@ TEST(DaemonTest, RemembersWhetherARunFinished) {
     if (!run || run->isFinished) continue;
     ++killed;
     EXPECT_EQ(run->day, device.yesterday);
-    EXPECT_EQ(run->task, "daily");
+    EXPECT_EQ(run->kind, RunKind::Daily);
     EXPECT_FALSE(run->process.isRunning());
   }
   EXPECT_GE(killed, 2);
@@ -192,7 +192,7 @@ TEST(DaemonTest, RemembersWhetherARunFinished) {
   const auto done = record();
   ASSERT_TRUE(done);
   EXPECT_TRUE(done->isFinished);
-  EXPECT_EQ(done->task, "forced");
+  EXPECT_EQ(done->kind, RunKind::Forced);
   EXPECT_EQ(done->lastFinished, done->ended);
 
   // A run with nothing to do leaves the record alone; one that cannot write it continues.

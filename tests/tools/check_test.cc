@@ -37,7 +37,7 @@ struct CheckTest : DeviceTest {
     FileSystem files;
     LastRun run;
     run.began = ago(kHour * 5);
-    run.task = "daily";
+    run.kind = RunKind::Daily;
     run.day = 20000;
     run.isFinished = isFinished;
     run.lastFinished = ago(finishedAgo);
@@ -114,11 +114,13 @@ TEST_F(CheckTest, TellsHowTheLastRunsWent) {
   writeRun(kHour, true, 2);
   expect("WARNING " + run + " finished, begun 5 h ago; 2 errors: cannot do 0; cannot do 1\n", 1);
   const auto before1970 = plist::Date::since1970(-0.5);
-  const plist::Dictionary old{{"Time", before1970}, {"LastFinished", before1970}};
+  const plist::Dictionary old{
+      {"Time", before1970}, {"LastFinished", before1970}, {"Finished", true}};
   device.write(kLastRunFile, *plist::writeBinary(old));
   EXPECT_EQ(
       device.json("status --check", {}, 2)["checks"][2]["figures"]["finished_timestamp_seconds"],
       -1);
+  expect("CRITICAL last-run: a run, which began no day's tasks, finished, begun ", 2);
 }
 
 TEST_F(CheckTest, JudgesPreferencesAndTheClock) {

@@ -36,9 +36,10 @@ Check lastRunCheck(CheckScene& scene, const LastRun& run) {
   check.figures.push_back({&kRunErrors, static_cast<double>(run.errorCount)});
   const std::string age = ageText(scene.ageOf(run.began));
   // A run of today's tasks counts as forced, too; only the day tells the two apart.
-  std::string what = run.task == "service" ? "the service's run"
-                     : run.task == "daily" ? "the daily run"
-                                           : "the forced run";
+  std::string what = !run.kind                      ? "a run"
+                     : run.kind == RunKind::Service ? "the service's run"
+                     : run.kind == RunKind::Daily   ? "the daily run"
+                                                    : "the forced run";
   what += run.day ? " of day " + dayText(lowInt32(*run.day)) : ", which began no day's tasks,";
   if (run.isFinished) {
     check.text = format("%s finished, begun %s ago", what, age);

@@ -11,6 +11,14 @@
 namespace tavrel {
 namespace {
 
+constexpr std::string_view kKindNames[] = {"daily", "forced", "today", "service"};
+
+std::optional<RunKind> kindNamed(std::optional<std::string_view> name) {
+  for (std::size_t i = 0; i < std::size(kKindNames); ++i)
+    if (name == kKindNames[i]) return static_cast<RunKind>(i);
+  return std::nullopt;
+}
+
 // The content of a kernel file without its line end; empty when it cannot be read.
 std::string kernelText(const std::string& path) {
   auto text = FileSystem().read(path, limits::kSystemFactBytes);
@@ -69,7 +77,7 @@ Expected<std::optional<LastRun>> LastRun::read(const DeviceRoot& root, FileSyste
   if (!began) return Error{"cannot use " + path + ": it is not the record of a run: remove it"};
   LastRun run;
   run.began = *began;
-  run.task = entries.string("Task").value_or("");
+  run.kind = kindNamed(entries.string("Task"));
   run.day = integerIn(entries, "Day");
   run.isFinished = entries.boolean("Finished").value_or(false);
   run.ended = entries.date("Ended");
@@ -86,12 +94,12 @@ Expected<std::optional<LastRun>> LastRun::read(const DeviceRoot& root, FileSyste
 
 Status LastRun::write(const DeviceRoot& root, FileSystem& files) const {
   plist::Dictionary entries{{"Time", began},
-                            {"Task", task},
                             {"Finished", isFinished},
                             {"ErrorCount", errorCount},
                             {"Process", process.process},
                             {"Started", process.started},
                             {"Boot", process.boot}};
+  if (kind) entries.set("Task", kKindNames[static_cast<std::size_t>(*kind)]);
   if (day) entries.set("Day", *day);
   if (ended) entries.set("Ended", *ended);
   if (lastFinished) entries.set("LastFinished", *lastFinished);

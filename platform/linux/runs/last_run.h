@@ -1,10 +1,11 @@
 // The record of the last run that did the tasks of a day, or that logged an error:
 //
 //   /var/lib/tavrel/last-run.plist
-//     Time (date, when it began), Task ("daily", "forced", "today" or "service"), Day (integer,
-//     absent when no day's tasks began), Finished (boolean), Ended (date), LastFinished (date, kept
-//     over runs that did not finish), Errors (array of strings, the first ones), ErrorCount
-//     (integer), and Process, Started, Boot, which identify the process
+//     Time (date, when it began), Task ("daily", "forced", "today" or "service"; absent when
+//     the process was not started for tasks), Day (integer, absent when no day's tasks began),
+//     Finished (boolean), Ended (date), LastFinished (date, kept over runs that did not finish),
+//     Errors (array of strings, the first ones), ErrorCount (integer), and Process, Started, Boot,
+//     which identify the process
 //
 // docs/status.md describes it.
 #pragma once
@@ -20,6 +21,7 @@
 #include "base/plist.h"
 #include "platform/linux/files/device_root.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/run_kind.h"
 
 namespace tavrel {
 
@@ -40,7 +42,7 @@ struct LastRun {
   static constexpr std::size_t kErrorBytes = 300;
 
   plist::Date began = plist::Date::since1970(0);
-  std::string task;
+  std::optional<RunKind> kind;
   std::optional<std::int64_t> day;
   bool isFinished = false;
   std::optional<plist::Date> ended;

@@ -7,10 +7,10 @@
 
 namespace tavrel {
 
-RunMemory::RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::string_view task)
+RunMemory::RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::optional<RunKind> kind)
     : root_(std::move(root)), clock_(clock), log_(log) {
   run_.began = clock_.now();
-  run_.task = task;
+  run_.kind = kind;
 }
 
 void RunMemory::write(LogLevel level, std::string_view message) {

@@ -1,6 +1,6 @@
 // A log that records which day's tasks a run did and what failed, for later queries.
 //
-//   RunMemory memory(root, clock, systemLog, "daily");
+//   RunMemory memory(root, clock, systemLog, RunKind::Daily);
 //   {
 //     LinuxPlatform linuxPlatform(root, {.log = &memory});
 //     ...
@@ -26,7 +26,7 @@ namespace tavrel {
 class RunMemory final : public SystemLog {
  public:
   /// Clock and log must outlive it.
-  RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::string_view task);
+  RunMemory(DeviceRoot root, Clock& clock, SystemLog& log, std::optional<RunKind> kind);
 
   /// Passes the entry on. Keeps errors, and writes the record at the line with which a day's tasks
   /// begin.
