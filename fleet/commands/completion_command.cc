@@ -1,26 +1,15 @@
 #include "fleet/commands/completion_command.h"
 
 #include <algorithm>
-#include <memory>
 #include <optional>
 #include <ostream>
 #include <string>
 
 #include "fleet/commands/question.h"
-#include "tools/completion/scripts/completion_script.h"
-#include "tools/completion/scripts/man_page.h"
+#include "tools/completion/scripts/completion.h"
 
 namespace tavrel::fleet {
 namespace {
-
-/// The names go to shells, so only those that need no quoting are printed.
-bool isPlain(std::string_view word) {
-  return !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
-    return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z') ||
-           (character >= '0' && character <= '9') ||
-           std::string_view("._-+/@%,").find(character) != std::string_view::npos;
-  });
-}
 
 /// The first word of the version that no other version contains.
 std::optional<std::string> wordFor(const Question& question, const std::string& version) {
@@ -29,7 +18,7 @@ std::optional<std::string> wordFor(const Question& question, const std::string& 
     const std::string word(rest.substr(0, rest.find(' ')));
     rest.remove_prefix(std::min(rest.size(), word.size() + 1));
     try {
-      if (isPlain(word) && question.readVersion(word) == version) return word;
+      if (isPlainWord(word) && question.readVersion(word) == version) return word;
     } catch (const std::runtime_error&) {
       // Other versions contain it, too.
     }
@@ -53,30 +42,8 @@ CompletedProgram completedProgram(const Command& program) {
 }  // namespace
 
 void addCompletionCommand(Command top, FleetContext& context) {
-  struct Arguments {
-    std::string what;
-    std::string file;
-  };
-  const auto arguments = std::make_shared<Arguments>();
-  const Command command =
-      top.addCommand("completion", "Print what shells complete, or the manual page");
-  command.hide();
-  command.addOption("WHAT", arguments->what, "A shell, a list, or man")
-      .required()
-      .oneOf({"bash", "zsh", "fish", "man", "versions"});
-  command.addOption("FILE", arguments->file, "Template of the manual page");
-  command.onRun([&context, arguments, top] {
-    const std::string& what = arguments->what;
-    if (what == "versions") return listVersions(context);
-    if (what == "man" && arguments->file.empty()) {
-      return context.failUsage("completion man needs FILE, the template of the page");
-    }
-    if (what == "man") return printManPage(context, arguments->file, modelOf(top));
-    const CompletedProgram program = completedProgram(top);
-    context.out() << (what == "bash"  ? bashScript(program)
-                      : what == "zsh" ? zshScript(program)
-                                      : fishScript(program));
-  });
+  addCompletion(top, context, completedProgram,
+                {{"versions", [&context] { listVersions(context); }}});
 }
 
 }  // namespace tavrel::fleet

@@ -1,33 +1,23 @@
 #include "tools/completion/completion_command.h"
 
 #include <algorithm>
-#include <memory>
 #include <ostream>
 #include <set>
 #include <string>
 
 #include "base/arithmetic.h"
-#include "base/ascii.h"
 #include "base/civil_time.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
-#include "tools/completion/scripts/completion_script.h"
-#include "tools/completion/scripts/man_page.h"
+#include "tools/completion/scripts/completion.h"
 #include "tools/stat/recorded.h"
 
 namespace tavrel {
 namespace {
 
-// Names go to shells. Only those of harmless characters are printed: they need no quoting, and no
-// key that somebody recorded can mean anything to a shell.
 void printWord(ToolContext& context, std::string_view word) {
-  const bool isPlain =
-      !word.empty() && word.front() != '-' && std::ranges::all_of(word, [](char character) {
-        return isLetterOrDigit(character) ||
-               std::string_view("._-+/@%,").find(character) != std::string_view::npos;
-      });
-  if (isPlain) context.out() << word << '\n';
+  if (isPlainWord(word)) context.out() << word << '\n';
 }
 
 // Lists the keys of yesterday and today only: a walk over all days would take too long.
@@ -93,33 +83,11 @@ CompletedProgram completedProgram(const Command& program) {
 }  // namespace
 
 void addCompletionCommand(Command program, ToolContext& context) {
-  struct Arguments {
-    std::string what;
-    std::string file;
-  };
-  const auto arguments = std::make_shared<Arguments>();
-  const Command command =
-      program.addCommand("completion", "Print what shells complete, or the manual page");
-  command.hide();
-  command.addOption("WHAT", arguments->what, "A shell, a list, or man")
-      .required()
-      .oneOf({"bash", "zsh", "fish", "man", "keys", "days", "domains", "logs"});
-  command.addOption("FILE", arguments->file, "Template of the manual page");
-  command.onRun([&context, arguments, program] {
-    const std::string& what = arguments->what;
-    if (what == "keys") return listKeys(context);
-    if (what == "days") return listDays(context);
-    if (what == "domains") return listDomains(context);
-    if (what == "logs") return listLogs(context);
-    if (what == "man" && arguments->file.empty()) {
-      return context.failUsage("completion man needs FILE, the template of the page");
-    }
-    if (what == "man") return printManPage(context, arguments->file, modelOf(program));
-    const CompletedProgram completed = completedProgram(program);
-    context.out() << (what == "bash"  ? bashScript(completed)
-                      : what == "zsh" ? zshScript(completed)
-                                      : fishScript(completed));
-  });
+  addCompletion(program, context, completedProgram,
+                {{"keys", [&context] { listKeys(context); }},
+                 {"days", [&context] { listDays(context); }},
+                 {"domains", [&context] { listDomains(context); }},
+                 {"logs", [&context] { listLogs(context); }}});
 }
 
 }  // namespace tavrel

@@ -48,16 +48,15 @@ Option Option::showDefault() const {
   return *this;
 }
 
-Option Option::oneOf(std::initializer_list<std::string> values) const {
+Option Option::oneOf(const std::vector<std::string>& values) const {
   // The description in braces is what modelOf() reads.
-  const std::vector<std::string> list(values);
   std::string choices;
-  for (const std::string& value : list)
+  for (const std::string& value : values)
     choices += (choices.empty() ? "" : ",") + value;
   option_->check(CLI::Validator(
-      [list](const std::string& text) {
-        const bool isOne = std::ranges::find(list, text) != list.end();
-        return isOne ? std::string() : format("not %s: %s", listed(list, "or"), text);
+      [values](const std::string& text) {
+        const bool isOne = std::ranges::find(values, text) != values.end();
+        return isOne ? std::string() : format("not %s: %s", listed(values, "or"), text);
       },
       "{" + choices + "}"));
   return *this;

@@ -11,8 +11,8 @@
 #pragma once
 
 #include <functional>
-#include <initializer_list>
 #include <string>
+#include <vector>
 
 namespace CLI {
 class App;
@@ -32,7 +32,7 @@ class Option {
   Option typeName(const char* name) const;
   /// Shows the target's current value in the help.
   Option showDefault() const;
-  Option oneOf(std::initializer_list<std::string> values) const;
+  Option oneOf(const std::vector<std::string>& values) const;
   /// `fault` returns what is wrong with the text of a value, or an empty string.
   Option check(std::function<std::string(const std::string& text)> fault) const;
   /// Refuses an empty value: in a script that is a variable without a value.
