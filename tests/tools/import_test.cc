@@ -5,6 +5,7 @@
 #include <sys/mount.h>
 #include <sys/stat.h>
 
+#include "base/limits.h"
 #include "device.h"
 #include "tools/shared/tool_context.h"
 #include "tools/stat/collect.h"
@@ -546,12 +547,14 @@ TEST(MachineSources, LeaveOutWhatCannotBe) {
   const std::string most = "18446744073709551615";
   device.write("/proc/stat", "cpu  1 0 0 " + most + " 0\n");
   device.write("/proc/meminfo", "MemAvailable: 5 kB\nMemTotal: 4 kB\n");
+  device.write("/proc/loadavg", "1 " + std::string(limits::kLiveFileBytes, '\n'));
   device.write("/proc/net/dev", "\n\na: " + most + " 0 0 0 0 0 0 0 7 0\nb: 1 0 0 0 0 0 0 0 9 0\n");
   device.write("/proc/diskstats", "8 0 sda 1 1 36028797018963968 1 1 1 2 1\n");
   device.write("/sys/block/sda/device/x", "");
   KeptLog log;
   MachineReading reading = MachineSources(device.root, log).read(Processes::LeftOut);
-  EXPECT_FALSE(reading.cpu || reading.memoryAvailableKib || reading.disk);
+  EXPECT_FALSE(reading.cpu || reading.memoryAvailableKib || reading.disk ||
+               reading.loadOfOneMinute);
   ASSERT_TRUE(reading.network);
   EXPECT_EQ(std::pair(std::to_string(reading.network->in), reading.network->out),
             std::pair(most, std::uint64_t{7}));

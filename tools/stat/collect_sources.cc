@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <array>
 #include <charconv>
-#include <fcntl.h>
 #include <filesystem>
 #include <string>
 #include <sys/statvfs.h>
@@ -15,25 +14,9 @@
 #include "base/ascii.h"
 #include "base/limits.h"
 #include "platform/linux/files/folder_walk.h"
-#include "platform/linux/live/kernel_file.h"
 
 namespace tavrel {
 namespace {
-
-// Bytes of a file in /proc or /sys; with hundreds of CPUs, some have about 100 KiB.
-constexpr std::size_t kLargestFile = 1U << 20;
-
-// Rereads the file into `content`, which is empty when that fails.
-void readAgain(const Descriptor& file, std::string& content) {
-  constexpr std::size_t kPart = 4096;
-  std::size_t size = 0;
-  for (ssize_t got = 1; got > 0; size += static_cast<std::size_t>(got)) {
-    if (content.size() < size + kPart) content.resize(size + kPart);
-    got = pread(file.get(), content.data() + size, kPart, static_cast<off_t>(size));
-    if (got < 0 || size > kLargestFile) return content.clear();
-  }
-  content.resize(size);
-}
 
 // Block devices that the kernel provides without hardware; there may be many.
 bool isVirtualDisk(std::string_view name) {
@@ -123,13 +106,11 @@ MachineSources::MachineSources(const DeviceRoot& root, SystemLog& log)
 std::string_view MachineSources::contentOf(std::string_view devicePath) {
   auto found = files_.find(devicePath);
   if (found == files_.end()) {
-    const std::string path = root_.pathOrMachine(devicePath);
-    Descriptor file(open(path.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK));
-    if (!file) return {};
+    live::KernelFile file(root_.pathOrMachine(devicePath), live::ReadMode::ToEnd);
     found = files_.emplace(devicePath, std::move(file)).first;
   }
-  readAgain(found->second, content_);
-  return content_;
+  const auto text = found->second.read(descriptors_, buffer_);
+  return text && !buffer_.isCut() ? *text : std::string_view();
 }
 
 bool MachineSources::isDisk(std::string_view name) {

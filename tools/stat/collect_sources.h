@@ -11,8 +11,8 @@
 #include <string>
 #include <string_view>
 
-#include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/device_root.h"
+#include "platform/linux/live/kernel_file.h"
 #include "platform/linux/live/slow_reads.h"
 
 namespace tavrel {
@@ -65,7 +65,8 @@ class MachineSources {
   MachineReading read(Processes processes);
 
  private:
-  /// The current content of a file, valid until the next call; empty when it cannot be read.
+  /// The current content of a file, valid until the next call; empty when it cannot be read as a
+  /// whole.
   std::string_view contentOf(std::string_view devicePath);
   void readCpu(MachineReading& reading);
   void readMemory(MachineReading& reading);
@@ -75,11 +76,12 @@ class MachineSources {
   bool isDisk(std::string_view name);
 
   const DeviceRoot& root_;
-  std::map<std::string, Descriptor, std::less<>> files_;  // by path on the device
-  std::map<std::string, bool, std::less<>> disks_;        // whether it is a disk, by name
+  std::map<std::string, live::KernelFile, std::less<>> files_;  // by path on the device
+  std::map<std::string, bool, std::less<>> disks_;              // whether it is a disk, by name
   std::map<std::string, std::shared_ptr<live::SlowFile>, std::less<>> zones_;  // by name
   live::SlowReads sensors_;
-  std::string content_;
+  live::DescriptorBudget descriptors_;
+  live::TextBuffer buffer_;
 };
 
 /// The unit of the kernel's CPU time, in ticks per second.
