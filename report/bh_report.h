@@ -20,9 +20,6 @@
 
 namespace tavrel {
 
-/// The name under which the submission service files the log.
-inline constexpr std::string_view kTalliedLogName = "log-tallied";
-
 class BHReport {
  public:
   /// Loads the whitelist; without one nothing is collected. The platform must outlive the report.

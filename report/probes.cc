@@ -8,6 +8,7 @@
 #include "base/format.h"
 #include "platform/statistics_store.h"
 #include "platform/store_path.h"
+#include "platform/tallied_log.h"
 #include "report/bh_report.h"
 #include "report/faultline_preferences.h"
 
@@ -75,11 +76,11 @@ void BHReport::addInstalledAppInfo() {
 void BHReport::addMetadataKeys() {
   Locale& locale = platform_.locale;
   const std::vector<std::string> preferred = locale.preferredLanguages();
-  _metadataOutput.set("BHUserInterfaceLanguage", firstOrUnknown(locale.matchLocalizations(
-                                                     locale.systemLanguages(), preferred)));
-  _metadataOutput.set("BHPreferredUserInterfaceLanguage", firstOrUnknown(preferred));
+  _metadataOutput.set(
+      kLanguageKey, firstOrUnknown(locale.matchLocalizations(locale.systemLanguages(), preferred)));
+  _metadataOutput.set(kPreferredLanguageKey, firstOrUnknown(preferred));
   if (const auto country = locale.countryCode()) {
-    _metadataOutput.set("BHUserSetRegionFormat", *country);
+    _metadataOutput.set(kRegionKey, *country);
   }
 }
 

@@ -2,6 +2,7 @@
 
 #include "base/utf8.h"
 #include "platform/persisted_state.h"
+#include "platform/tallied_log.h"
 #include "report/bh_report.h"
 
 namespace tavrel {
@@ -63,19 +64,19 @@ plist::Dictionary BHReport::logDictionary(std::int32_t day, const plist::Array& 
   const auto taskingPayload = preferences.ZTXPreferencesGetValue(kTaskingPayloadKey, kTavrelDomain);
 
   plist::Dictionary log{
-      {"BHCrashLogVersion", kLogVersion},
-      {"BHStartDate", platform_.statistics->dateForDaysSince1970(day)},
-      {"BHLogCreationDate", platform_.clock->now()},
-      {"BHMetadata", _metadataOutput},
-      {"BHScalars", _scalarsOutput},
-      {"BHDistributions", _distributionsOutput},
-      {"BHDistributionsHistogram", _histogramsOutput},
-      {"BHTasking", orDefault(taskingPayload, plist::Array::create())},
-      {"BHTaskID", orDefault(taskingID, "(no tasking id)")},
-      {"BHTaskDigest", orDefault(taskingDigest, "(no tasking digest)")},
-      {"BHWhitelistDigest", whitelistDigest},
+      {kVersionMember, kLogVersion},
+      {kStartDateMember, platform_.statistics->dateForDaysSince1970(day)},
+      {kCreationDateMember, platform_.clock->now()},
+      {kMetadataMember, _metadataOutput},
+      {kScalarsMember, _scalarsOutput},
+      {kDistributionsMember, _distributionsOutput},
+      {kHistogramsMember, _histogramsOutput},
+      {kTaskingMember, orDefault(taskingPayload, plist::Array::create())},
+      {kTaskIDMember, orDefault(taskingID, "(no tasking id)")},
+      {kTaskDigestMember, orDefault(taskingDigest, "(no tasking digest)")},
+      {kWhitelistDigestMember, whitelistDigest},
   };
-  if (appInfo) log.set("BHActivatedAppInfo", appInfo);
+  if (appInfo) log.set(kApplicationsMember, appInfo);
   return log;
 }
 
@@ -95,14 +96,14 @@ void BHReport::noteOSVersion(plist::Dictionary& options) {
   if (current == kUnknownOSVersion || plist::Value(current) == stored) return;
   preferences.ZTXPreferencesSetValue(kLastOSVersionKey, current, kTavrelDomain);
   preferences.ZTXPreferencesSynchronize(kTavrelDomain);
-  options.set("previous_os_version", stored.string().value_or("<unknown>"));
+  options.set(kPreviousOSVersionOption, stored.string().value_or("<unknown>"));
 }
 
 void BHReport::addConfigNumber(plist::Dictionary& options) {
   if (!platform_.submission->hasInternalDiagnostics(kInternalDiagnosticsIdentifier)) return;
   const auto answer = platform_.deviceAnswers->SQCopyAnswer("ConfigNumber").data();
   if (!answer) return;
-  if (const auto text = terminatedText(answer.bytes())) options.set("ConfigNumber", *text);
+  if (const auto text = terminatedText(answer.bytes())) options.set(kConfigNumberOption, *text);
 }
 
 }  // namespace tavrel

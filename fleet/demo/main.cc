@@ -11,6 +11,7 @@
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "fleet/demo/simulated_device.h"
+#include "platform/tallied_log.h"
 
 namespace {
 
@@ -33,8 +34,9 @@ void write(const std::filesystem::path& path, const std::string& content) {
 /// "log-tallied-20261124T060000Z-0000002a", as a device names a log.
 std::string nameOf(const SimulatedLog& log, std::size_t number) {
   const CivilTime time = civilFromSeconds(log.filed);
-  return format("log-tallied-%04d%02u%02uT%02u%02u%02uZ-%08zx", static_cast<int>(time.date.year),
-                time.date.month, time.date.day, time.hour, time.minute, time.second, number);
+  return format("%s-%04d%02u%02uT%02u%02u%02uZ-%08zx", kTalliedLogName,
+                static_cast<int>(time.date.year), time.date.month, time.date.day, time.hour,
+                time.minute, time.second, number);
 }
 
 void run(std::int32_t devices, std::int32_t days, const std::filesystem::path& folder) {
@@ -47,9 +49,9 @@ void run(std::int32_t devices, std::int32_t days, const std::filesystem::path& f
     for (std::int32_t day = firstDay; day <= kLastDay; ++day) {
       const auto log = device.live(day);
       if (!log) continue;
-      const std::string name = nameOf(*log, logs++);
-      write(folder / (name + ".metadata.plist"), log->metadata);
-      write(folder / (name + ".log"), log->log);
+      const std::string path = (folder / nameOf(*log, logs++)).string();
+      write(std::string(path).append(kLogMetadataEnding), log->metadata);
+      write(std::string(path).append(kLogEnding), log->log);
     }
   }
   std::cout << logs << " logs of " << devices << " devices in " << folder.string() << "\n";

@@ -4,6 +4,7 @@
 #include <array>
 #include <cmath>
 
+#include "platform/tallied_log.h"
 #include "report/bh_report.h"
 
 namespace tavrel::fleet {
@@ -153,11 +154,11 @@ std::optional<SimulatedLog> SimulatedDevice::live(std::int32_t day) {
   fakes::FakeSubmission::Log log = std::move(platform_.submission.logs.back());
   platform_.submission.logs.clear();
 
-  Dictionary metadata{{"LogType", log.type},
-                      {"LogName", log.name},
-                      {"OSVersion", platform_.submission.osVersion},
-                      {"Time", platform_.clock.instant}};
-  if (log.options && !log.options.empty()) metadata.set("Options", log.options);
+  Dictionary metadata{{kLogMetadataType, log.type},
+                      {kLogMetadataName, log.name},
+                      {kLogMetadataVersion, platform_.submission.osVersion},
+                      {kLogMetadataTime, platform_.clock.instant}};
+  if (log.options && !log.options.empty()) metadata.set(kLogMetadataOptions, log.options);
   return SimulatedLog{std::move(log.content), *platform_.propertyLists.encodeXml(metadata), filed};
 }
 

@@ -10,6 +10,7 @@
 #include "fleet/sources/sources.h"
 #include "platform/linux/files/digests.h"
 #include "platform/plist/coding.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -65,10 +66,11 @@ std::string PermittedKeys::faultOf(const LogRecord& record) const {
                   key.substr(0, kShownBytes));
   };
   for (const ScalarRow& row : record.scalars) {
-    if (!whitelist->second.scalars.permit(row.key)) return fault("BHScalars", row.key);
+    if (!whitelist->second.scalars.permit(row.key)) return fault(kScalarsMember, row.key);
   }
   for (const DistributionRow& row : record.distributions) {
-    if (!whitelist->second.distributions.permit(row.key)) return fault("BHDistributions", row.key);
+    if (!whitelist->second.distributions.permit(row.key))
+      return fault(kDistributionsMember, row.key);
   }
   return {};
 }

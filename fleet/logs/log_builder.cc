@@ -10,6 +10,7 @@
 #include "fleet/logs/interval_label.h"
 #include "fleet/logs/limits.h"
 #include "fleet/logs/record_order.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel::fleet {
 
@@ -31,10 +32,9 @@ enum class LogBuilder::Member : std::uint8_t {
 namespace {
 
 constexpr std::array<std::string_view, 10> kMembers = {
-    "BHCrashLogVersion", "BHStartDate",     "BHLogCreationDate",
-    "BHScalars",         "BHDistributions", "BHDistributionsHistogram",
-    "BHMetadata",        "BHTaskID",        "BHWhitelistDigest",
-    "BHActivatedAppInfo"};
+    kVersionMember,         kStartDateMember,   kCreationDateMember, kScalarsMember,
+    kDistributionsMember,   kHistogramsMember,  kMetadataMember,     kTaskIDMember,
+    kWhitelistDigestMember, kApplicationsMember};
 constexpr std::size_t kRequiredMembers = 6;
 
 constexpr std::size_t kShownBytes = 100;
@@ -340,11 +340,11 @@ bool LogBuilder::string(std::string_view text) {
       if (member_ == Member::WhitelistDigest) return keepText(text, record_.whitelistDigest);
       return isIgnored() || wrongType();
     case Place::Metadata:
-      if (inner_ == "BHUserInterfaceLanguage") return keepText(text, record_.language);
-      if (inner_ == "BHPreferredUserInterfaceLanguage") {
+      if (inner_ == kLanguageKey) return keepText(text, record_.language);
+      if (inner_ == kPreferredLanguageKey) {
         return keepText(text, record_.preferredLanguage);
       }
-      return inner_ != "BHUserSetRegionFormat" || keepText(text, record_.region);
+      return inner_ != kRegionKey || keepText(text, record_.region);
     case Place::Application: {
       ApplicationRow& application = record_.applications.back();
       if (inner_ == "bundle") return keepText(text, application.bundle);
@@ -386,7 +386,7 @@ bool LogBuilder::finish() {
     }
   }
   if (record_.created < std::int64_t{record_.day} * kSecondsPerDay) {
-    fault_ = "BHLogCreationDate: is before the day that the log reports";
+    fault_ = format("%s: is before the day that the log reports", kCreationDateMember);
     return false;
   }
   fault_ = putInOrder(record_);

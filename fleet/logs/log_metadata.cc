@@ -6,12 +6,12 @@
 #include "base/utf8.h"
 #include "fleet/logs/limits.h"
 #include "platform/plist/coding.h"
+#include "platform/submission.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel::fleet {
 namespace {
 
-constexpr std::string_view kTalliedType = "193";
-constexpr std::string_view kTalliedName = "log-tallied";
 constexpr std::string_view kNoVersion = "<unknown>";
 
 std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
@@ -20,9 +20,9 @@ std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
 }
 
 void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
-  if (key == "ConfigNumber") metadata.configNumber = std::move(value);
+  if (key == kConfigNumberOption) metadata.configNumber = std::move(value);
   // The first log of a device says here that there was no earlier version.
-  else if (key == "previous_os_version" && value != kNoVersion) {
+  else if (key == kPreviousOSVersionOption && value != kNoVersion) {
     metadata.previousOsVersion = std::move(value);
   }
 }
@@ -70,10 +70,10 @@ Expected<LogMetadata> readMetadataFile(ByteSpan document) {
   if (!value) return value.error();
   const plist::Dictionary dictionary = value->dictionary();
   LogMetadata metadata;
-  metadata.logType = textOf(dictionary, "LogType");
-  metadata.osVersion = textOf(dictionary, "OSVersion");
-  const plist::Dictionary options = dictionary.dictionary("Options");
-  for (const std::string_view key : {"previous_os_version", "ConfigNumber"})
+  metadata.logType = textOf(dictionary, kLogMetadataType);
+  metadata.osVersion = textOf(dictionary, kLogMetadataVersion);
+  const plist::Dictionary options = dictionary.dictionary(kLogMetadataOptions);
+  for (const std::string_view key : {kPreviousOSVersionOption, kConfigNumberOption})
     setOption(metadata, key, textOf(options, key));
   if (std::string fault = faultOf(metadata); !fault.empty()) return Error{std::move(fault)};
   return metadata;
@@ -109,9 +109,10 @@ void readOptions(std::string_view options, LogMetadata& metadata) {
 }
 
 bool isOtherLog(std::string_view fileName, const LogMetadata* metadata) {
-  if (metadata != nullptr && !metadata->logType.empty()) return metadata->logType != kTalliedType;
+  if (metadata != nullptr && !metadata->logType.empty())
+    return metadata->logType != kTalliedLogType;
   const std::string_view name = logNameOf(fileName);
-  return !name.empty() && name != kTalliedName;
+  return !name.empty() && name != kTalliedLogName;
 }
 
 }  // namespace tavrel::fleet

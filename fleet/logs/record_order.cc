@@ -7,6 +7,7 @@
 #include <vector>
 
 #include "base/format.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel::fleet {
 namespace {
@@ -58,10 +59,10 @@ const char* histogramFault(std::span<const CellRow> cells, std::uint64_t count) 
 
 std::string putInOrder(LogRecord& record) {
   if (const ScalarRow* const twice = sortByKey(record.scalars)) {
-    return fault("BHScalars", twice->key, "occurs twice");
+    return fault(kScalarsMember, twice->key, "occurs twice");
   }
   if (const DistributionRow* const twice = sortByKey(record.distributions)) {
-    return fault("BHDistributions", twice->key, "occurs twice");
+    return fault(kDistributionsMember, twice->key, "occurs twice");
   }
   sortCells(record.cells);
   auto distribution = record.distributions.begin();
@@ -73,10 +74,10 @@ std::string putInOrder(LogRecord& record) {
     while (distribution != record.distributions.end() && distribution->key < key)
       ++distribution;
     if (distribution == record.distributions.end() || distribution->key != key) {
-      return fault("BHDistributionsHistogram", key, "has no distribution");
+      return fault(kHistogramsMember, key, "has no distribution");
     }
     if (const char* const reason = histogramFault({first, cell}, distribution->numbers.count)) {
-      return fault("BHDistributionsHistogram", key, reason);
+      return fault(kHistogramsMember, key, reason);
     }
   }
   return {};

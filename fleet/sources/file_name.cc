@@ -3,10 +3,11 @@
 #include <algorithm>
 #include <array>
 
+#include "platform/tallied_log.h"
+
 namespace tavrel::fleet {
 namespace {
 
-constexpr std::string_view kMetadataEnding = ".metadata.plist";
 constexpr std::string_view kGzipEnding = ".gz";
 constexpr std::array<std::string_view, 11> kArchiveEndings = {
     ".tar", ".tar.gz",  ".tgz",  ".tar.bz2", ".tbz2",  ".tar.xz",
@@ -20,13 +21,13 @@ bool isArchiveName(std::string_view name) {
 }
 
 bool isMetadataName(std::string_view name) {
-  return name.ends_with(kMetadataEnding);
+  return name.ends_with(kLogMetadataEnding);
 }
 
 bool isLogName(std::string_view name) {
   if (name.starts_with('.') || isMetadataName(name)) return false;
   name = withoutGzip(name);
-  return name.ends_with(".log") || name.ends_with(".plist");
+  return name.ends_with(kLogEnding) || name.ends_with(".plist");
 }
 
 std::string_view withoutGzip(std::string_view name) {
@@ -38,7 +39,7 @@ std::string sidecarOf(std::string_view logPath) {
   const std::string_view path = withoutGzip(logPath);
   const std::string_view name = fileNameOf(path);
   const std::size_t dot = std::min(name.rfind('.'), name.size());
-  return std::string(path.substr(0, path.size() - name.size() + dot)).append(kMetadataEnding);
+  return std::string(path.substr(0, path.size() - name.size() + dot)).append(kLogMetadataEnding);
 }
 
 std::string_view fileNameOf(std::string_view path) {

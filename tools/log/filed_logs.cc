@@ -74,7 +74,8 @@ void readFacts(ToolContext& context, std::vector<FiledLog>& logs) {
 }  // namespace
 
 std::string_view nameOf(FileSubmission::Place place) {
-  constexpr std::string_view kNames[] = {"pending", "outbox", "withheld", "refused"};
+  constexpr std::string_view kNames[] = {kPendingFolder, kOutboxFolder, kWithheldFolder,
+                                         kRefusedFolder};
   return kNames[static_cast<std::size_t>(place)];
 }
 

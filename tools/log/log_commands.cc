@@ -15,7 +15,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/plist/coding.h"
-#include "report/bh_report.h"
+#include "platform/tallied_log.h"
 #include "tools/log/filed_logs.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/log/log_document.h"

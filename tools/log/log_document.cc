@@ -7,6 +7,7 @@
 #include "base/iso_date.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/log_day.h"
+#include "platform/tallied_log.h"
 #include "tools/log/log_faults.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
@@ -163,19 +164,19 @@ void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictio
   if (const auto day = dayOfLog(document)) {
     printField(page, "Day", dayText(*day));
   } else {
-    printFieldOf(page, "Day", document.get("BHStartDate"));
+    printFieldOf(page, "Day", document.get(kStartDateMember));
   }
-  printFieldOf(page, "Created", document.get("BHLogCreationDate"));
-  printFieldOf(page, "Version", document.get("BHCrashLogVersion"));
-  printFieldOf(page, "Whitelist", document.get("BHWhitelistDigest"));
-  printFieldOf(page, "Tasking", document.get("BHTaskID"));
-  printFieldOf(page, "Task digest", document.get("BHTaskDigest"));
-  if (const plist::Array tasking = document.array("BHTasking")) {
+  printFieldOf(page, "Created", document.get(kCreationDateMember));
+  printFieldOf(page, "Version", document.get(kVersionMember));
+  printFieldOf(page, "Whitelist", document.get(kWhitelistDigestMember));
+  printFieldOf(page, "Tasking", document.get(kTaskIDMember));
+  printFieldOf(page, "Task digest", document.get(kTaskDigestMember));
+  if (const plist::Array tasking = document.array(kTaskingMember)) {
     printField(page, "Settings", std::to_string(tasking.size()));
   }
 
-  printValues(page, "Metadata", document.dictionary("BHMetadata"), Table::Align::Left);
-  printValues(page, "Scalars", document.dictionary("BHScalars"), Table::Align::Right);
+  printValues(page, "Metadata", document.dictionary(kMetadataMember), Table::Align::Left);
+  printValues(page, "Scalars", document.dictionary(kScalarsMember), Table::Align::Right);
   printDistributions(page, distributionsOf(document));
 
   if (const auto faults = faultsOf(document); !faults.empty()) {
@@ -184,11 +185,11 @@ void printLog(const Page& page, const LogEnvelope& envelope, const plist::Dictio
       page.out << "  " << printable(fault) << '\n';
   }
 
-  for (const auto& [title, key] : {std::pair("Tasking settings", "BHTasking"),
-                                   std::pair("Activated applications", "BHActivatedAppInfo")}) {
+  for (const auto& [title, key] : {std::pair("Tasking settings", kTaskingMember),
+                                   std::pair("Activated applications", kApplicationsMember)}) {
     const plist::Array list = document.array(key);
     if (!list) continue;
-    if (list.empty() && key == std::string_view("BHTasking")) continue;
+    if (list.empty() && key == kTaskingMember) continue;
     printTitle(page, title, list.size());
     for (const plist::Value& element : list) {
       page.out << "  " << printable(inlineText(element)) << '\n';
@@ -202,18 +203,18 @@ Json jsonOfLog(const LogEnvelope& envelope, const plist::Dictionary& document) {
     log["day"] = *day;
     log["date"] = dayDateText(*day);
   }
-  log["start"] = jsonField(document.get("BHStartDate"));
-  log["created"] = jsonField(document.get("BHLogCreationDate"));
-  log["version"] = jsonField(document.get("BHCrashLogVersion"));
-  log["whitelist_digest"] = jsonField(document.get("BHWhitelistDigest"));
-  log["task_id"] = jsonField(document.get("BHTaskID"));
-  log["task_digest"] = jsonField(document.get("BHTaskDigest"));
-  log["tasking"] = jsonField(document.get("BHTasking"));
-  log["metadata"] = jsonField(document.get("BHMetadata"));
-  log["scalars"] = jsonField(document.get("BHScalars"));
+  log["start"] = jsonField(document.get(kStartDateMember));
+  log["created"] = jsonField(document.get(kCreationDateMember));
+  log["version"] = jsonField(document.get(kVersionMember));
+  log["whitelist_digest"] = jsonField(document.get(kWhitelistDigestMember));
+  log["task_id"] = jsonField(document.get(kTaskIDMember));
+  log["task_digest"] = jsonField(document.get(kTaskDigestMember));
+  log["tasking"] = jsonField(document.get(kTaskingMember));
+  log["metadata"] = jsonField(document.get(kMetadataMember));
+  log["scalars"] = jsonField(document.get(kScalarsMember));
   log["distributions"] = jsonOfDistributions(distributionsOf(document));
   log["faults"] = faultsOf(document);
-  if (const auto apps = document.get("BHActivatedAppInfo")) {
+  if (const auto apps = document.get(kApplicationsMember)) {
     log["activated_applications"] = jsonField(apps);
   }
   return log;

@@ -5,6 +5,7 @@
 #include <string_view>
 
 #include "base/format.h"
+#include "platform/tallied_log.h"
 #include "tools/shared/distribution_view.h"
 #include "tools/shared/value_text.h"
 
@@ -20,18 +21,18 @@ struct Member {
 };
 
 constexpr Member kMembers[] = {
-    {"BHActivatedAppInfo", Kind::Array, "an array"},
-    {"BHCrashLogVersion", Kind::Number, "a number"},
-    {"BHDistributions", Kind::Dictionary, "a dictionary"},
-    {"BHDistributionsHistogram", Kind::Dictionary, "a dictionary"},
-    {"BHLogCreationDate", Kind::Date, "a date"},
-    {"BHMetadata", Kind::Dictionary, "a dictionary"},
-    {"BHScalars", Kind::Dictionary, "a dictionary"},
-    {"BHStartDate", Kind::Date, "a date"},
-    {"BHTaskDigest", Kind::Null, ""},
-    {"BHTaskID", Kind::Null, ""},
-    {"BHTasking", Kind::Array, "an array"},
-    {"BHWhitelistDigest", Kind::String, "a string"},
+    {kApplicationsMember, Kind::Array, "an array"},
+    {kVersionMember, Kind::Number, "a number"},
+    {kDistributionsMember, Kind::Dictionary, "a dictionary"},
+    {kHistogramsMember, Kind::Dictionary, "a dictionary"},
+    {kCreationDateMember, Kind::Date, "a date"},
+    {kMetadataMember, Kind::Dictionary, "a dictionary"},
+    {kScalarsMember, Kind::Dictionary, "a dictionary"},
+    {kStartDateMember, Kind::Date, "a date"},
+    {kTaskDigestMember, Kind::Null, ""},
+    {kTaskIDMember, Kind::Null, ""},
+    {kTaskingMember, Kind::Array, "an array"},
+    {kWhitelistDigestMember, Kind::String, "a string"},
 };
 
 std::string notA(std::string_view path, const plist::Value& value, std::string_view wanted) {
@@ -40,9 +41,9 @@ std::string notA(std::string_view path, const plist::Value& value, std::string_v
 
 void checkHistogram(const plist::Dictionary& summaries, const plist::Entry& histogram,
                     std::vector<std::string>& faults) {
-  const std::string path = format("BHDistributionsHistogram/%s", histogram.key);
+  const std::string path = format("%s/%s", kHistogramsMember, histogram.key);
   if (!isSummary(summaries.get(histogram.key))) {
-    faults.push_back(path + ": has no summary in BHDistributions");
+    faults.push_back(format("%s: has no summary in %s", path, kDistributionsMember));
   }
   const plist::Dictionary buckets = histogram.value.dictionary();
   if (!buckets) faults.push_back(notA(path, histogram.value, "a dictionary"));
@@ -58,7 +59,7 @@ void checkHistogram(const plist::Dictionary& summaries, const plist::Entry& hist
 
 bool isTalliedLog(const plist::Value& document) {
   const plist::Dictionary log = document.dictionary();
-  return log.get("BHCrashLogVersion") || log.get("BHScalars") || log.get("BHDistributions");
+  return log.get(kVersionMember) || log.get(kScalarsMember) || log.get(kDistributionsMember);
 }
 
 std::vector<std::string> faultsOf(const plist::Dictionary& log) {
@@ -72,16 +73,17 @@ std::vector<std::string> faultsOf(const plist::Dictionary& log) {
       faults.push_back(notA(entry.key, entry.value, member->kindText));
     }
   }
-  for (const plist::Entry& scalar : log.dictionary("BHScalars")) {
+  for (const plist::Entry& scalar : log.dictionary(kScalarsMember)) {
     if (scalar.value.number()) continue;
-    faults.push_back(notA(format("BHScalars/%s", scalar.key), scalar.value, "a number"));
+    faults.push_back(notA(format("%s/%s", kScalarsMember, scalar.key), scalar.value, "a number"));
   }
-  const plist::Dictionary summaries = log.dictionary("BHDistributions");
+  const plist::Dictionary summaries = log.dictionary(kDistributionsMember);
   for (const plist::Entry& summary : summaries) {
     if (isSummary(summary.value)) continue;
-    faults.push_back(format("BHDistributions/%s: is not a summary of five numbers", summary.key));
+    faults.push_back(
+        format("%s/%s: is not a summary of five numbers", kDistributionsMember, summary.key));
   }
-  for (const plist::Entry& histogram : log.dictionary("BHDistributionsHistogram")) {
+  for (const plist::Entry& histogram : log.dictionary(kHistogramsMember)) {
     checkHistogram(summaries, histogram, faults);
   }
   std::sort(faults.begin(), faults.end());

@@ -12,7 +12,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/log_day.h"
 #include "platform/plist/coding.h"
-#include "report/bh_report.h"
+#include "platform/tallied_log.h"
 #include "tools/log/filed_logs.h"
 #include "tools/shared/day_argument.h"
 #include "tools/shared/table.h"

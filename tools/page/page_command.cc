@@ -10,6 +10,7 @@
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/platform.h"
 #include "platform/plist/coding.h"
+#include "platform/tallied_log.h"
 #include "tools/log/log_preview.h"
 #include "tools/page/sections.h"
 #include "tools/shared/day_argument.h"
@@ -42,7 +43,7 @@ PageLog pageLogOf(ToolContext& context, const LogPreview& preview, std::int32_t 
     log.reason = value.error().message;
     return log;
   }
-  log.scalars = value->dictionary().dictionary("BHScalars");
+  log.scalars = value->dictionary().dictionary(kScalarsMember);
   log.distributions = distributionsOf(value->dictionary());
   return log;
 }

@@ -5,6 +5,7 @@
 #include <cmath>
 #include <limits>
 
+#include "platform/tallied_log.h"
 #include "tools/shared/table.h"
 
 namespace tavrel {
@@ -62,8 +63,8 @@ bool isSummary(const plist::Value& entry) {
 }
 
 std::vector<DistributionView> distributionsOf(const plist::Dictionary& log) {
-  const plist::Dictionary summaries = log.dictionary("BHDistributions");
-  const plist::Dictionary histograms = log.dictionary("BHDistributionsHistogram");
+  const plist::Dictionary summaries = log.dictionary(kDistributionsMember);
+  const plist::Dictionary histograms = log.dictionary(kHistogramsMember);
   std::vector<DistributionView> views;
   for (const plist::Entry& entry : summaries) {
     const plist::Array summary = entry.value.array();

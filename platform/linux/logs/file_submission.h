@@ -35,13 +35,6 @@
 
 namespace tavrel {
 
-/// Entries of a log's metadata.
-inline constexpr std::string_view kLogMetadataType = "LogType";       // string
-inline constexpr std::string_view kLogMetadataName = "LogName";       // string
-inline constexpr std::string_view kLogMetadataTime = "Time";          // date
-inline constexpr std::string_view kLogMetadataVersion = "OSVersion";  // string
-inline constexpr std::string_view kLogMetadataOptions = "Options";    // dictionary, when given
-
 class FileSubmission final : public SubmissionService {
  public:
   enum class Place { Pending, Outbox, Withheld, Refused };

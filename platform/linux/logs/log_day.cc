@@ -4,7 +4,9 @@
 
 #include "base/bytes.h"
 #include "base/civil_time.h"
+#include "base/format.h"
 #include "base/iso_date.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel {
 namespace {
@@ -19,11 +21,11 @@ std::optional<std::int32_t> dayIn32Bits(plist::Date start) {
 // many keys. Text contains no "<", and deeper keys have more tabs, so nothing else matches. Nothing
 // for a log in another form.
 std::optional<std::int32_t> dayInText(std::string_view text) {
-  constexpr std::string_view kBefore = "\n\t<key>BHStartDate</key>\n\t<date>";
+  const std::string before = format("\n\t<key>%s</key>\n\t<date>", kStartDateMember);
   if (!text.ends_with("</plist>\n")) return std::nullopt;
-  const std::size_t found = text.rfind(kBefore);
+  const std::size_t found = text.rfind(before);
   if (found == text.npos) return std::nullopt;
-  text.remove_prefix(found + kBefore.size());
+  text.remove_prefix(found + before.size());
   const auto start = parseIsoInstant(text.substr(0, text.find('<')));
   return start ? dayIn32Bits(*start) : std::nullopt;
 }
@@ -31,7 +33,7 @@ std::optional<std::int32_t> dayInText(std::string_view text) {
 }  // namespace
 
 std::optional<std::int32_t> dayOfLog(const plist::Dictionary& log) {
-  const auto start = log.date("BHStartDate");
+  const auto start = log.date(kStartDateMember);
   return start ? dayIn32Bits(*start) : std::nullopt;
 }
 

@@ -17,6 +17,7 @@
 
 #include "base/expected.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/tallied_log.h"
 
 namespace tavrel {
 
@@ -29,11 +30,6 @@ inline constexpr std::string_view kRefusedFolder = "refused";    // by the serve
 
 /// The number of withheld logs that are kept, the newest.
 inline constexpr std::size_t kWithheldLogs = 8;
-
-inline constexpr std::string_view kLogEnding = ".log";
-
-/// The ending of a log's metadata file, whose name otherwise equals the log's.
-inline constexpr std::string_view kLogMetadataEnding = ".metadata.plist";
 
 /// True for a day in the future: it was recorded while the clock was ahead.
 constexpr bool isAhead(std::int64_t day, std::int64_t today) {
