@@ -17,7 +17,7 @@ namespace {
 
 constexpr std::size_t kShownBytes = 100;
 
-// The entries of one table, from all groups that the daemon would load.
+// The entries of one table, from all groups.
 std::vector<std::string> entriesOf(const plist::Dictionary& whitelist, std::string_view table) {
   std::vector<std::string> entries;
   for (const plist::Entry& group : whitelist) {

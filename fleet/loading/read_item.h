@@ -10,7 +10,7 @@
 namespace tavrel::fleet {
 
 struct ReadItem {
-  /// `kFile` or `kContent` after a successful read; a refused item keeps its path or content.
+  /// `File` or `Content` after a successful read; a refused item keeps its path or content.
   SourceItem source;
   std::optional<LogRecord> record;
   std::size_t bytes = 0;  // of the document that was read

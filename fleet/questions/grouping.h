@@ -15,12 +15,12 @@ namespace tavrel::fleet {
 bool versionLess(std::string_view a, std::string_view b);
 
 /// One group for each value of the attribute that occurs among `logs`, in order (versions by
-/// number, days by date); `kNone` yields one group. Values with fewer than `logsAtLeast` logs form
-/// one group of the kind kOther, and so do those beyond the thousand most frequent, except days.
+/// number, days by date); `None` yields one group. Values with fewer than `logsAtLeast` logs form
+/// one group of the kind `Other`, and so do those beyond the thousand most frequent, except days.
 std::vector<Group> groupsOf(const LogTable& table, const LogSet& logs, GroupBy by,
                             std::size_t logsAtLeast);
 
-/// Removes the groups of too few devices, and the one of the kind kOther.
+/// Removes the groups of too few devices, and the one of the kind `Other`.
 void leaveSmallOut(std::vector<Group>& groups, const Ledger& ledger);
 
 /// The versions that have enough devices on these days, by number.

@@ -69,7 +69,7 @@ class Ledger {
 std::string subjectOf(KeyKind kind, const std::string& key);
 std::string subjectOfMeans(KeyKind kind, const std::string& key);
 
-/// A group of the kind kOther is never shown by itself.
+/// A group of the kind `Other` is never shown by itself.
 struct Group {
   PartName name;
   LogSet logs;
@@ -81,7 +81,7 @@ struct Division {
   LogSet whole;
   bool isShown = false;  // when false, nothing of it may be shown
   std::vector<Group> groups;
-  /// How many values were joined into the last group, which is of the kind kOther.
+  /// How many values were joined into the last group, which is of the kind `Other`.
   std::size_t joined = 0;
 };
 

@@ -15,7 +15,7 @@ enum class PartKind : std::uint8_t {
 
 struct PartName {
   PartKind kind = PartKind::Whole;
-  std::string value = {};  // empty unless the kind is kValue
+  std::string value = {};  // empty unless the kind is `Value`
 
   bool isValue() const { return kind == PartKind::Value; }
   /// For people: "(all)", "(not reported)", "(other)", or the value, in quotation marks when it

@@ -21,9 +21,9 @@ struct SourceItem {
   };
   Kind kind = Kind::File;
   std::string name;     // for people: a path, or "ARCHIVE: MEMBER"
-  std::string path;     // of `kFile`
-  std::string content;  // of `kContent`
-  std::string reason;   // of `kRefused` and `kSkipped`
+  std::string path;     // of `File`
+  std::string content;  // of `Content`
+  std::string reason;   // of `Refused` and `Skipped`
   std::optional<LogMetadata> metadata;
   bool hasSidecar = false;  // NAME.metadata.plist is beside the file
   bool mayBeLink = false;   // because the user named the file

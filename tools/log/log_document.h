@@ -12,8 +12,9 @@ namespace tavrel {
 
 /// A log's surroundings: its place, and the metadata of the submission service.
 struct LogEnvelope {
-  std::string place;  // "pending", "outbox", "preview" or "file"
-  std::string path;   // empty for a preview
+  /// "pending", "outbox", "withheld", "refused", "preview" or "file"
+  std::string place;
+  std::string path;  // empty for a preview
   plist::Dictionary metadata;
 };
 
