@@ -17,18 +17,18 @@ struct SummaryOptions : QuestionOptions {
   bool keys = false;
 };
 
-struct PartName {
+struct PartTitle {
   GroupBy by;
   const char* name;   // in JSON and CSV
   const char* title;  // of the column
 };
-constexpr PartName kParts[] = {{GroupBy::Os, "os", "OS VERSION"},
-                               {GroupBy::Region, "region", "REGION"},
-                               {GroupBy::Digest, "digest", "WHITELIST"},
-                               {GroupBy::Day, "day", "DAY"}};
+constexpr PartTitle kParts[] = {{GroupBy::Os, "os", "OS VERSION"},
+                                {GroupBy::Region, "region", "REGION"},
+                                {GroupBy::Digest, "digest", "WHITELIST"},
+                                {GroupBy::Day, "day", "DAY"}};
 
-const PartName& nameOf(GroupBy by) {
-  for (const PartName& part : kParts) {
+const PartTitle& titleOf(GroupBy by) {
+  for (const PartTitle& part : kParts) {
     if (part.by == by) return part;
   }
   return kParts[0];
@@ -53,7 +53,7 @@ void printText(FleetContext& context, const SummaryAnswer& answer) {
   for (const SummaryPart& part : answer.parts) {
     out << "\n";
     using Align = Table::Align;
-    Table table({{nameOf(part.by).title, Align::Whole},
+    Table table({{titleOf(part.by).title, Align::Whole},
                  {"DEVICES", Align::Right},
                  {"LOGS", Align::Right, 1},
                  {"FIRST DAY", Align::Whole, 3},
@@ -64,7 +64,7 @@ void printText(FleetContext& context, const SummaryAnswer& answer) {
     }
     if (!table.empty()) table.print(context.page());
     const std::string joined = joinedText(part.joined, !part.groups.empty(), answer.devicesAtLeast);
-    if (table.empty()) out << nameOf(part.by).title << "\n";
+    if (table.empty()) out << titleOf(part.by).title << "\n";
     if (!joined.empty()) out << joined << "\n";
   }
 }
@@ -88,7 +88,7 @@ Json summaryJson(const SummaryAnswer& answer) {
     Json groups = Json::array();
     for (const CountedGroup& group : part.groups)
       groups.push_back(groupJson(group));
-    json["by"][nameOf(part.by).name] = {{"groups", std::move(groups)}, {"joined", part.joined}};
+    json["by"][titleOf(part.by).name] = {{"groups", std::move(groups)}, {"joined", part.joined}};
   }
   json["statistics"] = {{"scalars", answer.scalarKeys},
                         {"distributions", answer.distributionKeys},
@@ -108,7 +108,7 @@ void printCsv(std::ostream& out, const SummaryAnswer& answer) {
   row("none", answer.whole);
   for (const SummaryPart& part : answer.parts) {
     for (const CountedGroup& group : part.groups)
-      row(nameOf(part.by).name, group);
+      row(titleOf(part.by).name, group);
   }
 }
 

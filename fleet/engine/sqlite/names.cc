@@ -37,7 +37,7 @@ std::string_view joined(std::string& out, Parts... parts) {
 
 }  // namespace
 
-std::optional<std::int64_t> Dictionary::find(std::string_view text) {
+std::optional<std::int64_t> NumbersOfTexts::find(std::string_view text) {
   if (entries_.empty()) return {};
   std::size_t& expected = entries_[last_].follower;
   if (entries_[expected].text != text) {
@@ -49,7 +49,7 @@ std::optional<std::int64_t> Dictionary::find(std::string_view text) {
   return entries_[last_].number;
 }
 
-void Dictionary::add(std::string_view text, std::int64_t number) {
+void NumbersOfTexts::add(std::string_view text, std::int64_t number) {
   const std::string_view kept = texts_.keep(text);
   places_.emplace(kept, entries_.size());
   entries_.push_back({kept, number, 0});
@@ -92,7 +92,7 @@ void Names::refresh() {
 }
 
 std::int64_t Names::key(KeyKind kind, std::string_view name) {
-  Dictionary& numbers = keyNumbers_[static_cast<std::size_t>(kind)];
+  NumbersOfTexts& numbers = keyNumbers_[static_cast<std::size_t>(kind)];
   if (const auto known = numbers.find(name)) return *known;
   const std::int64_t id = keys_.next(connection_);
   keys_.addition.bind(1, id);

@@ -19,7 +19,7 @@ namespace tavrel::fleet {
 
 /// Maps texts to numbers, in memory. Logs mostly have the same texts in the same order, so each
 /// entry remembers which one was looked up after it.
-class Dictionary {
+class NumbersOfTexts {
  public:
   std::optional<std::int64_t> find(std::string_view text);
   void add(std::string_view text, std::int64_t number);
@@ -66,11 +66,11 @@ class Names {
 
   const Connection& connection_;
   Table keys_;
-  std::array<Dictionary, 3> keyNumbers_;  // by kind
+  std::array<NumbersOfTexts, 3> keyNumbers_;  // by kind
   Table buckets_;
-  Dictionary bucketNumbers_;
+  NumbersOfTexts bucketNumbers_;
   Table applications_;
-  Dictionary applicationNumbers_;
+  NumbersOfTexts applicationNumbers_;
   std::string text_;
 };
 
