@@ -13,6 +13,7 @@
 #include "fleet/commands/fleet_context.h"
 #include "fleet/questions/ledger.h"
 #include "fleet/questions/log_table.h"
+#include "fleet/questions/part_name.h"
 
 namespace tavrel::fleet {
 

@@ -6,10 +6,13 @@
 #include <string_view>
 #include <vector>
 
+#include "fleet/engine/engine.h"
+#include "fleet/questions/division.h"
 #include "fleet/questions/ledger.h"
-#include "fleet/questions/show.h"
 
 namespace tavrel::fleet {
+
+enum class GroupBy : std::uint8_t { None, Os, Region, Day, Digest };
 
 /// Orders texts the way people number versions: "4.9" before "4.10".
 bool versionLess(std::string_view a, std::string_view b);

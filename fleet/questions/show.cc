@@ -7,7 +7,6 @@
 #include "fleet/questions/cell_classes.h"
 #include "fleet/questions/day_range.h"
 #include "fleet/questions/exact_moments.h"
-#include "fleet/questions/grouping.h"
 #include "fleet/questions/merged_numbers.h"
 #include "fleet/questions/scalar_histogram.h"
 

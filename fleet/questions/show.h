@@ -9,13 +9,13 @@
 #include <vector>
 
 #include "fleet/engine/engine.h"
+#include "fleet/questions/grouping.h"
 #include "fleet/questions/histogram.h"
 #include "fleet/questions/ledger.h"
 #include "fleet/questions/log_table.h"
+#include "fleet/questions/part_name.h"
 
 namespace tavrel::fleet {
-
-enum class GroupBy : std::uint8_t { None, Os, Region, Day, Digest };
 
 inline constexpr std::array<unsigned, 5> kPercents = {5, 25, 50, 75, 95};
 

@@ -3,8 +3,6 @@
 #include <span>
 #include <vector>
 
-#include "fleet/questions/grouping.h"
-
 namespace tavrel::fleet {
 
 namespace {

@@ -6,8 +6,9 @@
 #include <vector>
 
 #include "fleet/engine/engine.h"
+#include "fleet/questions/grouping.h"
 #include "fleet/questions/ledger.h"
-#include "fleet/questions/show.h"
+#include "fleet/questions/part_name.h"
 
 namespace tavrel::fleet {
 
