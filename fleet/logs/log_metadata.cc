@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/format.h"
 #include "base/utf8.h"
 #include "fleet/logs/limits.h"
@@ -27,13 +28,6 @@ void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
   }
 }
 
-int hexDigit(char digit) {
-  if (digit >= '0' && digit <= '9') return digit - '0';
-  if (digit >= 'A' && digit <= 'F') return digit - 'A' + 10;
-  if (digit >= 'a' && digit <= 'f') return digit - 'a' + 10;
-  return -1;
-}
-
 // The log's name, when the file is named like a submitted log: NAME-YYYYMMDDTHHMMSSZ-XXXXXXXX.log
 std::string_view logNameOf(std::string_view fileName) {
   constexpr std::string_view kForm = "-########T######Z-xxxxxxxx.log";
@@ -41,8 +35,8 @@ std::string_view logNameOf(std::string_view fileName) {
   const std::size_t at = fileName.size() - kForm.size();
   for (std::size_t i = 0; i < kForm.size(); ++i) {
     const char found = fileName[at + i];
-    const bool fits = kForm[i] == '#'   ? found >= '0' && found <= '9'
-                      : kForm[i] == 'x' ? hexDigit(found) >= 0
+    const bool fits = kForm[i] == '#'   ? isDigit(found)
+                      : kForm[i] == 'x' ? hexDigit(found).has_value()
                                         : found == kForm[i];
     if (!fits) return {};
   }
@@ -84,10 +78,10 @@ std::string percentDecoded(std::string_view text) {
   decoded.reserve(text.size());
   for (std::size_t i = 0; i < text.size(); ++i) {
     if (text[i] == '%' && i + 2 < text.size()) {
-      const int high = hexDigit(text[i + 1]);
-      const int low = hexDigit(text[i + 2]);
-      if (high >= 0 && low >= 0) {
-        decoded += static_cast<char>(high * 16 + low);
+      const auto high = hexDigit(text[i + 1]);
+      const auto low = hexDigit(text[i + 2]);
+      if (high && low) {
+        decoded += static_cast<char>(*high * 16 + *low);
         i += 2;
         continue;
       }

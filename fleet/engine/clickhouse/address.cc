@@ -5,6 +5,7 @@
 #include <memory>
 #include <utility>
 
+#include "base/ascii.h"
 #include "base/parse_number.h"
 #include "fleet/engine/engine.h"
 #include "fleet/engine/regular_file.h"
@@ -36,9 +37,7 @@ std::string part(CURLU* url, CURLUPart which, unsigned flags = CURLU_URLDECODE) 
 
 // Names go into statements unquoted.
 void checkName(const std::string& what, std::string_view name) {
-  const auto isPlain = [](char c) {
-    return (c >= 'a' && c <= 'z') || (c >= 'A' && c <= 'Z') || (c >= '0' && c <= '9') || c == '_';
-  };
+  const auto isPlain = [](char c) { return isLetterOrDigit(c) || c == '_'; };
   if (name.empty() || !std::all_of(name.begin(), name.end(), isPlain))
     refuse("needs a " + what + " with a name of letters, digits and underscores");
 }

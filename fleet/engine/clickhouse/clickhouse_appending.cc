@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <unordered_set>
 
+#include "base/ascii.h"
 #include "fleet/engine/clickhouse/clickhouse_reading.h"
 #include "fleet/engine/clickhouse/row_binary.h"
 
@@ -26,11 +27,10 @@ std::size_t rowsOf(const LogRecord& record) {
 }
 
 std::string literalOf(std::string_view bytes) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
   std::string out = "'";
-  for (const char c : bytes) {
-    const auto byte = static_cast<unsigned char>(c);
-    out += {'\\', 'x', kDigits[byte >> 4], kDigits[byte & 0xF]};
+  for (const char byte : bytes) {
+    out += "\\x";
+    appendHexByte(out, byte);
   }
   return out + "'";
 }

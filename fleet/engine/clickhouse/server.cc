@@ -8,6 +8,7 @@
 #include <new>
 #include <thread>
 
+#include "base/ascii.h"
 #include "http/curl_handle.h"
 
 namespace tavrel::fleet {
@@ -193,14 +194,11 @@ void Server::retry(const std::function<void()>& operation) const {
 }
 
 std::string quoted(std::string_view text) {
-  static constexpr char kDigits[] = "0123456789ABCDEF";
   std::string out = "'";
   for (const char c : text) {
-    const auto byte = static_cast<unsigned char>(c);
-    if (byte < ' ' || c == '\'' || c == '\\') {
+    if (static_cast<unsigned char>(c) < ' ' || c == '\'' || c == '\\') {
       out += "\\x";
-      out += kDigits[byte >> 4];
-      out += kDigits[byte & 0xF];
+      appendHexByte(out, c);
     } else {
       out += c;
     }
