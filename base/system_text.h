@@ -1,3 +1,4 @@
+// Error numbers of the system as text.
 #pragma once
 
 #include <string>

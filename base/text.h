@@ -5,7 +5,6 @@
 // data quoted. A null object is "(null)".
 #pragma once
 
-#include <cstdint>
 #include <optional>
 #include <string>
 #include <string_view>

@@ -11,7 +11,6 @@
 //   16  payload, directly followed by the next item
 #pragma once
 
-#include <cstddef>
 #include <optional>
 #include <string_view>
 

@@ -1,8 +1,6 @@
 // tavrelctl send, notify: a client of the service, and the notifications.
 #pragma once
 
-#include <string_view>
-
 #include "base/expected.h"
 #include "base/plist.h"
 #include "tools/shared/tool_context.h"

@@ -2,8 +2,6 @@
 #pragma once
 
 #include <string>
-#include <utility>
-#include <vector>
 
 #include "base/plist.h"
 #include "tools/shared/tool_output.h"

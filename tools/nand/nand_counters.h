@@ -1,7 +1,6 @@
 // Shows the counters of a NAND chip to people and programs.
 #pragma once
 
-#include <iosfwd>
 #include <string_view>
 
 #include "storage/telemetry_counters.h"

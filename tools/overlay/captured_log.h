@@ -1,3 +1,4 @@
+// A log that the platform in memory keeps instead of submitting it.
 #pragma once
 
 #include <string>

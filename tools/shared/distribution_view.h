@@ -1,12 +1,10 @@
 // The distributions and histograms of a tallied log, read back; histograms as bars.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <span>
 #include <string>
-#include <string_view>
 #include <vector>
 
 #include "base/plist.h"

@@ -13,7 +13,6 @@
 #pragma once
 
 #include <nlohmann/json_fwd.hpp>
-#include <string>
 #include <string_view>
 
 #include "base/expected.h"

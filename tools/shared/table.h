@@ -3,10 +3,9 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <iosfwd>
-#include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "tools/shared/page.h"

@@ -3,7 +3,6 @@
 
 #include <chrono>
 #include <cstdint>
-#include <string>
 #include <string_view>
 
 #include "tools/shared/tool_context.h"

@@ -11,7 +11,6 @@
 #include <cstdint>
 #include <memory>
 #include <string>
-#include <string_view>
 
 #include "base/expected.h"
 #include "tools/shared/tool_context.h"

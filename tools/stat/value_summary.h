@@ -13,7 +13,6 @@
 
 #include <cstdint>
 #include <span>
-#include <string>
 #include <vector>
 
 #include "tools/shared/distribution_view.h"

@@ -1,5 +1,6 @@
 #include "platform/linux/files/random.h"
 
+#include <array>
 #include <cerrno>
 #include <sys/random.h>
 #include <time.h>

@@ -1,8 +1,6 @@
 // Random bytes, for names and identifiers that must not collide.
 #pragma once
 
-#include <array>
-#include <cstddef>
 #include <string>
 
 #include "base/bytes.h"

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <cerrno>
-#include <string>
 #include <string_view>
 
 #include "base/expected.h"

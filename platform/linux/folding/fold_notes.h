@@ -8,7 +8,6 @@
 
 #include <cstdint>
 #include <ctime>
-#include <string>
 #include <string_view>
 #include <unordered_set>
 

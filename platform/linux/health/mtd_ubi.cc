@@ -1,5 +1,7 @@
 #include "platform/linux/health/mtd_ubi.h"
 
+#include "platform/linux/health/sysfs.h"
+
 namespace tavrel::health {
 namespace {
 

@@ -2,9 +2,9 @@
 #pragma once
 
 #include <span>
+#include <string>
 
 #include "platform/linux/health/figure.h"
-#include "platform/linux/health/sysfs.h"
 
 namespace tavrel::health {
 

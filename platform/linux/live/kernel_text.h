@@ -2,7 +2,6 @@
 // text may contain anything.
 #pragma once
 
-#include <cstddef>
 #include <cstdint>
 #include <optional>
 #include <span>

@@ -12,7 +12,6 @@
 // error, writes nothing.
 #pragma once
 
-#include <string>
 #include <string_view>
 
 #include "platform/clock.h"

@@ -10,6 +10,7 @@
 
 #include "base/arithmetic.h"
 #include "platform/linux/files/file_system.h"
+#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/linux/store/sqlite_schema.h"
 #include "platform/linux/store/sqlite_segments.h"

@@ -18,7 +18,6 @@
 #include <vector>
 
 #include "base/expected.h"
-#include "platform/linux/store/chunk_runs.h"
 #include "platform/linux/store/sqlite_connection.h"
 #include "platform/linux/store/sqlite_site.h"
 
