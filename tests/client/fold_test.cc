@@ -8,7 +8,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "folding.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 namespace {

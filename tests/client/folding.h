@@ -12,7 +12,7 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "recording.h"
-#include "tests/platform/temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 

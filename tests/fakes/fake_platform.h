@@ -16,7 +16,7 @@
 #include "base/text.h"
 #include "platform/platform.h"
 #include "platform/plist/coding.h"
-#include "tests/fakes/plist_matching.h"
+#include "tests/helpers/plist_matching.h"
 
 namespace tavrel::fakes {
 

@@ -4,8 +4,8 @@
 #include <fcntl.h>
 #include <stdlib.h>
 
-#include "tests/platform/temporary_root.h"
-#include "tests/upload/servers.h"
+#include "tests/devices/servers.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel::fleet {
 

@@ -5,10 +5,10 @@
 #include <random>
 #include <thread>
 
+#include "clickhouse_server.h"
+#include "engine_records.h"
 #include "fleet/engine/open/open_engine.h"
-#include "tests/fleet/clickhouse_server.h"
-#include "tests/fleet/engine_records.h"
-#include "tests/platform/temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel::fleet {
 namespace {

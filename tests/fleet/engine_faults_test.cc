@@ -4,10 +4,10 @@
 #include <sys/stat.h>
 #include <thread>
 
+#include "clickhouse_server.h"
+#include "engine_records.h"
 #include "fleet/engine/open/open_engine.h"
-#include "tests/fleet/clickhouse_server.h"
-#include "tests/fleet/engine_records.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel::fleet {
 namespace {

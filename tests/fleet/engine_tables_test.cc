@@ -1,9 +1,9 @@
 // The tables as people and other programs see them, and tables spread over several servers.
 #include <sqlite3.h>
 
+#include "clickhouse_server.h"
+#include "engine_records.h"
 #include "fleet/engine/open/open_engine.h"
-#include "tests/fleet/clickhouse_server.h"
-#include "tests/fleet/engine_records.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -6,14 +6,14 @@
 #include <map>
 #include <random>
 
+#include "engine_records.h"
 #include "fleet/engine/open/open_engine.h"
 #include "fleet/pages/sections.h"
 #include "fleet/questions/compare.h"
 #include "fleet/questions/grouping.h"
 #include "fleet/questions/show.h"
 #include "fleet/questions/summary.h"
-#include "tests/fleet/engine_records.h"
-#include "tests/platform/temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -5,13 +5,13 @@
 #include <limits>
 #include <random>
 
+#include "engine_records.h"
 #include "fleet/questions/day_range.h"
 #include "fleet/questions/grouping.h"
 #include "fleet/questions/histogram.h"
 #include "fleet/questions/merged_numbers.h"
 #include "fleet/questions/scalar_histogram.h"
 #include "fleet/questions/student.h"
-#include "tests/fleet/engine_records.h"
 
 namespace tavrel::fleet {
 namespace {

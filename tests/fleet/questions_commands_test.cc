@@ -7,12 +7,12 @@
 #include <regex>
 #include <sstream>
 
+#include "clickhouse_server.h"
+#include "engine_records.h"
 #include "fleet/commands/csv_writer.h"
 #include "fleet/commands/show_output.h"
 #include "fleet/fleet_tool.h"
-#include "tests/fakes/command_line.h"
-#include "tests/fleet/clickhouse_server.h"
-#include "tests/fleet/engine_records.h"
+#include "tests/helpers/command_line.h"
 
 namespace tavrel::fleet {
 namespace {

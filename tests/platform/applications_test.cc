@@ -2,10 +2,10 @@
 #include <csignal>
 #include <sys/inotify.h>
 
-#include "device_services.h"
 #include "platform/application_registry.h"
 #include "platform/linux/device/linux_applications.h"
 #include "platform/linux/files/descriptor.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

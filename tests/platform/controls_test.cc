@@ -1,7 +1,7 @@
 
-#include "device_services.h"
 #include "platform/linux/device/linux_dynamic_loader.h"
 #include "platform/linux/device/linux_system_controls.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

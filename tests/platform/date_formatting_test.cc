@@ -1,7 +1,7 @@
 #include <cmath>
 
-#include "device_services.h"
 #include "platform/linux/locale/linux_date_formatting.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -1,9 +1,9 @@
 // The queue of ECC events, and the errors that the kernel counts.
 #include "platform/linux/device/ecc_events.h"
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/device/linux_system_controls.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

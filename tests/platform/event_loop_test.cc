@@ -2,7 +2,7 @@
 #include <fcntl.h>
 
 #include "platform/linux/process/linux_event_loop.h"
-#include "temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 namespace {

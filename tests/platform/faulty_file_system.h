@@ -2,12 +2,13 @@
 #pragma once
 
 #include <cerrno>
+#include <fcntl.h>
 #include <map>
 #include <set>
 #include <sys/stat.h>
 
 #include "platform/linux/files/file_system.h"
-#include "temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 

@@ -1,8 +1,8 @@
 #include "platform/linux/files/file_system.h"
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/files/property_list_file.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

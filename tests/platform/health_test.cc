@@ -9,7 +9,7 @@
 #include "platform/persisted_state.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
-#include "temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel::health {
 namespace {

@@ -2,11 +2,11 @@
 
 #include <ctime>
 
-#include "device_services.h"
 #include "platform/linux/health/reading.h"
 #include "platform/linux/live/live_machine.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/report_protocol.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -1,9 +1,9 @@
 #include "platform/locale.h"
 
-#include "device_services.h"
 #include "platform/linux/locale/language_matching.h"
 #include "platform/linux/locale/language_tag.h"
 #include "platform/linux/locale/linux_locale.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -4,7 +4,6 @@
 #include <signal.h>
 #include <sys/file.h>
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/device/ecc_events.h"
 #include "platform/linux/folding/segment_fold.h"
@@ -13,6 +12,7 @@
 #include "platform/linux/logs/file_crash_reporting.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/platform.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -1,8 +1,8 @@
 #include <cmath>
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/logs/json_line.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -1,8 +1,8 @@
 // The recorded registry: services, numbered methods, the hub, and the folder of recordings.
 
-#include "device_services.h"
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recorded_snapshots.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -4,7 +4,6 @@
 #include <sys/resource.h>
 #include <sys/socket.h>
 
-#include "device_services.h"
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
 #include "platform/linux/service/service_message.h"
@@ -12,6 +11,7 @@
 #include "platform/linux/service/socket_service.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

@@ -7,7 +7,6 @@
 
 #include "base/instant.h"
 #include "base/program.h"
-#include "device_services.h"
 #include "platform/guarded.h"
 #include "platform/linux/device/file_device_answers.h"
 #include "platform/linux/device/linux_system_version.h"
@@ -18,6 +17,7 @@
 #include "platform/linux/logs/json_line.h"
 #include "platform/linux/system_log/linux_standard_streams.h"
 #include "platform/linux/system_log/linux_system_log.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 namespace {

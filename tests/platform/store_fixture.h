@@ -3,8 +3,8 @@
 #include <limits>
 #include <sqlite3.h>
 
-#include "device_services.h"
 #include "platform/linux/store/sqlite_store.h"
+#include "tests/devices/device_services.h"
 
 namespace tavrel {
 

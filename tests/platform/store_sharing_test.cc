@@ -4,7 +4,7 @@
 #include "platform/linux/store/sqlite_log_file.h"
 #include "platform/store_path.h"
 #include "store_fixture.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 namespace {

@@ -2,12 +2,12 @@
 
 #include <set>
 
-#include "device_services.h"
 #include "faulty_file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/json_line.h"
 #include "platform/linux/logs/log_file_name.h"
+#include "tests/devices/device_services.h"
 #include "tests/fakes/fake_platform.h"
 
 namespace tavrel {

@@ -5,7 +5,7 @@
 #include "platform/persisted_state.h"
 #include "report/histogram.h"
 #include "tests/fakes/fake_platform.h"
-#include "tests/fakes/fingerprint.h"
+#include "tests/helpers/fingerprint.h"
 
 namespace tavrel {
 namespace {
@@ -65,7 +65,7 @@ TEST_F(BHReportTest, ALogHasTheSameBitsEverywhere) {
   fake.store.distributions = {{"bars", kDay, values},
                               {"plain", kDay, {values.begin() + 5, values.end()}}};
   write();
-  EXPECT_EQ(fakes::fingerprint(fake.submission.logs.at(0).content), 0x21DD10E09375F695U);
+  EXPECT_EQ(fingerprint(fake.submission.logs.at(0).content), 0x21DD10E09375F695U);
 }
 
 TEST_F(BHReportTest, CarriesAppInfoAndTasking) {

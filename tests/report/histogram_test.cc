@@ -4,7 +4,7 @@
 #include <gtest/gtest.h>
 #include <limits>
 
-#include "tests/fakes/plist_matching.h"
+#include "tests/helpers/plist_matching.h"
 
 namespace tavrel {
 namespace {

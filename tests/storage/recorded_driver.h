@@ -5,7 +5,7 @@
 
 #include "platform/linux/recorded/recorded_registry.h"
 #include "tests/fakes/fake_platform.h"
-#include "tests/fakes/fingerprint.h"
+#include "tests/helpers/fingerprint.h"
 
 namespace tavrel::fakes {
 

@@ -65,7 +65,7 @@ const std::string kLine =
     "WO=   2/   5/   8/  11 WL=      3/      6/      9/     12 WM=    4/    7/   10/   13\n";
 
 TEST(Snapshot, RendersWholeRecordsOfTheFixedLayoutAndLikeOnesByDescriptor) {
-  EXPECT_EQ(fakes::fingerprint(kKey), 0xB502D424D3993697U);
+  EXPECT_EQ(fingerprint(kKey), 0xB502D424D3993697U);
   const std::string records = record(0) + record(7) + record(7);
   EXPECT_EQ(render(records.substr(0, 251)), kKey + "\n");
   EXPECT_EQ(render(records.substr(252, 500)), kKey + kLine + "\n");

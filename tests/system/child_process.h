@@ -6,7 +6,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 

@@ -2,6 +2,7 @@
 #include <array>
 #include <sstream>
 
+#include "child_process.h"
 #include "config/bh_config.h"
 #include "daemon/app_info_listener.h"
 #include "daemon/entry.h"
@@ -15,9 +16,8 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
 #include "platform/plist/xml.h"
-#include "tests/fakes/plist_matching.h"
-#include "tests/platform/temporary_root.h"
-#include "tests/system/child_process.h"
+#include "tests/devices/temporary_root.h"
+#include "tests/helpers/plist_matching.h"
 
 namespace tavrel {
 namespace {

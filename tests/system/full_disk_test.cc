@@ -2,11 +2,11 @@
 #include <sys/statvfs.h>
 
 #include "base/format.h"
+#include "child_process.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
-#include "tests/platform/temporary_root.h"
-#include "tests/system/child_process.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 namespace {

@@ -6,6 +6,7 @@
 #include <set>
 #include <sys/wait.h>
 
+#include "device.h"
 #include "platform/linux/health/ata_smart.h"
 #include "platform/linux/health/flash_life.h"
 #include "platform/linux/health/mtd_ubi.h"
@@ -13,7 +14,6 @@
 #include "platform/linux/live/device_tables.h"
 #include "storage/key_map_table.h"
 #include "storage/parse/statistic_keys.h"
-#include "tests/tools/device.h"
 
 namespace tavrel {
 namespace {

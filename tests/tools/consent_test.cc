@@ -1,7 +1,7 @@
 #include "base/civil_time.h"
 #include "device.h"
 #include "platform/linux/store/kept_values.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 namespace {

@@ -18,8 +18,8 @@
 #include "base/format.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/plist/xml.h"
-#include "tests/fakes/command_line.h"
-#include "tests/platform/temporary_root.h"
+#include "tests/devices/temporary_root.h"
+#include "tests/helpers/command_line.h"
 #include "tools/shared/json_value.h"
 #include "tools/tavrelctl.h"
 

@@ -4,7 +4,7 @@
 
 #include "base/civil_time.h"
 #include "device.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 namespace {

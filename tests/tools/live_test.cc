@@ -5,7 +5,7 @@
 
 #include "base/iso_date.h"
 #include "catalogue/catalogue.h"
-#include "tests/tools/device.h"
+#include "device.h"
 
 namespace tavrel {
 namespace {

@@ -3,8 +3,8 @@
 
 #include <sys/file.h>
 
-#include "servers.h"
-#include "tests/platform/device_services.h"
+#include "tests/devices/device_services.h"
+#include "tests/devices/servers.h"
 #include "upload/uploader.h"
 
 namespace tavrel {

@@ -4,7 +4,7 @@
 #include "base/limits.h"
 #include "device.h"
 #include "platform/linux/files/random.h"
-#include "tests/system/killed_process.h"
+#include "tests/helpers/killed_process.h"
 
 namespace tavrel {
 namespace {

@@ -1,4 +1,4 @@
-#include "tests/client/recording.h"
+#include "recording.h"
 
 namespace tavrel {
 namespace {

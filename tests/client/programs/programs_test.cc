@@ -1,5 +1,5 @@
 // Other ways to record: the tool, Python and StatsD.
-#include "tests/client/recording.h"
+#include "recording.h"
 
 namespace tavrel {
 namespace {

@@ -3,10 +3,10 @@
 #include <sys/socket.h>
 #include <sys/un.h>
 
+#include "recording.h"
 #include "statsd/recording_watch.h"
 #include "statsd/statsd_recorder.h"
 #include "statsd/statsd_sockets.h"
-#include "tests/client/recording.h"
 
 namespace tavrel {
 namespace {

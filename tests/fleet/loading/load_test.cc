@@ -11,8 +11,8 @@
 #include "fleet/sources/sources.h"
 #include "platform/linux/files/digests.h"
 #include "platform/linux/files/file_system.h"
-#include "tests/fleet/loading/sample_log.h"
-#include "tests/platform/temporary_root.h"
+#include "sample_log.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -7,7 +7,7 @@
 #include "fleet/logs/limits.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
-#include "tests/fleet/loading/sample_log.h"
+#include "sample_log.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -9,7 +9,7 @@
 #include "base/text.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/plist/coding.h"
-#include "temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 

@@ -11,7 +11,7 @@
 #include "base/base64.h"
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/digests.h"
-#include "tests/platform/temporary_root.h"
+#include "tests/devices/temporary_root.h"
 
 namespace tavrel {
 

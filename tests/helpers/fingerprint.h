@@ -4,7 +4,7 @@
 #include <cstdint>
 #include <string_view>
 
-namespace tavrel::fakes {
+namespace tavrel {
 
 inline std::uint64_t fingerprint(std::string_view text) {
   std::uint64_t hash = 0xCBF29CE484222325;
@@ -13,4 +13,4 @@ inline std::uint64_t fingerprint(std::string_view text) {
   return hash;
 }
 
-}  // namespace tavrel::fakes
+}  // namespace tavrel
