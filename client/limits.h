@@ -27,9 +27,9 @@ enum {
    * each, of 20 KiB. */
   kFilesBeforeFold = 256,
 
-  /* Of the segments begun beyond that, one in so many asks, whichever ones the clock picks: folds
-   * leave the files of live processes, and no program knows how many there are. A prime, which
-   * clocks that advance by a round number of nanoseconds reach as well. */
+  /* Beyond that, one in this many new segments asks, and the clock decides which. A fold leaves the
+   * files of live processes; when these alone exceed the number, each new program would start a
+   * fold in vain. A prime, which clocks that advance by a round number of nanoseconds reach too. */
   kSegmentsPerFold = 127,
 
   /* Names tried for a new file. They contain a time in nanoseconds; a collision means that a

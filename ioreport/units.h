@@ -33,7 +33,8 @@ std::optional<std::string_view> IOReportChannelGetUnitLabel(const plist::Diction
 KernelReturn getFactorsFromScale(std::uint32_t factorWord, std::uint32_t scale,
                                  std::uint64_t& numerator, std::uint64_t& denominator);
 
-/// Whether the factors of a unit are right: not those of a special scale, and without wrapping.
+/// Whether a unit has factors that fit 64 bits: those of a special scale are unknown, and larger
+/// ones wrap.
 bool hasExactFactors(std::uint64_t unit);
 
 /// Not-a-number when the units differ in quantity or one cannot be converted.

@@ -61,7 +61,8 @@ std::string takeUrl(std::string_view text, Configuration& configuration) {
   if (scheme != "https" && scheme != "http") {
     return kNoUrl;
   }
-  // libcurl has no part for an empty query or fragment, behind which names of logs would be lost.
+  // libcurl reports no part for an empty query or fragment, but a log's name after one would not
+  // belong to the path.
   if (partOf(url.get(), CURLUPART_USER) || partOf(url.get(), CURLUPART_PASSWORD) ||
       text.find_first_of("?#") != std::string_view::npos) {
     return "URL has more than a host and a path: leave out user, query and fragment";

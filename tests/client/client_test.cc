@@ -87,6 +87,7 @@ TEST_F(Recording, AChildWithoutValuesHoldsNoSegment) {
   const Gate forked, seen;
   run([&] {
     add(1);
+    // Only for root can the library have mapped something there.
     EXPECT_EQ(msync(nullptr, 1, MS_ASYNC), -1) << "something is mapped where no segment was";
     if (fork() == 0) {
       forked.open();

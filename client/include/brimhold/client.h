@@ -28,10 +28,10 @@
  *    some milliseconds). While the clock is older than this library, as on a device that has just
  *    started without a battery clock, values are dated once it has been set.
  *  - A set replaces what this process added or set earlier that day; when two processes set a
- *    scalar, the later set counts. What processes that have not set it since the last fold have
- *    added since then, before the set or after it, comes on top. Adds that follow a process's own
- *    set belong to that set: if another process has set the scalar later, the next fold drops
- *    them with it, even those that came last.
+ *    scalar, the later set counts. Added on top is what other processes have added since the last
+ *    fold, before the set or after it, unless they have set the scalar themselves in that time.
+ *    Adds that follow a process's own set belong to that set: if another process has set the
+ *    scalar later, the next fold drops them with it, even those that came last.
  *  - A process that records faster than the system folds (some 200,000 records) loses the excess,
  *    and the system counts the loss.
  *
@@ -61,8 +61,8 @@ typedef struct BHClientDistributionKey BHClientDistributionKey;
 /* Looks up a key; the same name gives the same handle. The name is copied. Never returns NULL: the
  * values of a refused key are dropped. A key is refused when it is NULL, empty or longer than 1024
  * bytes, has control characters or is not UTF-8, when the process would have more than 4096 keys
- * or 256 KiB of names, and when there is no memory for the library yet: then look it up again. The
- * other calls accept NULL, and drop the value. */
+ * or 256 KiB of names, or when the library could not get its memory; in that case look the key up
+ * again later. The other calls accept NULL, and drop the value. */
 BH_CLIENT_PUBLIC BHClientScalarKey* BHClientScalarForKey(const char* key);
 BH_CLIENT_PUBLIC BHClientDistributionKey* BHClientDistributionForKey(const char* key);
 
