@@ -13,7 +13,7 @@
 #include "fleet/commands/page_command.h"
 #include "fleet/commands/show_command.h"
 #include "fleet/commands/summary_command.h"
-#include "tools/shared/command_line.h"
+#include "tools/console/command_line.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -13,11 +13,11 @@
 #include "platform/plist/encodable_text.h"
 #include "storage/parse/asp_parser.h"
 #include "support.h"
+#include "tools/console/json_value.h"
+#include "tools/console/typed_value.h"
 #include "tools/log/log_document.h"
 #include "tools/nand/nand_build.h"
 #include "tools/records/record_reader.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/typed_value.h"
 
 using namespace tavrel;
 using fuzz::require;

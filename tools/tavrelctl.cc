@@ -10,6 +10,7 @@
 #include "tools/completion/completion_command.h"
 #include "tools/consent/erase_command.h"
 #include "tools/consent/permission_commands.h"
+#include "tools/console/command_line.h"
 #include "tools/device/limits_commands.h"
 #include "tools/device/prefs_commands.h"
 #include "tools/device/send_commands.h"
@@ -26,7 +27,6 @@
 #include "tools/rehearsal/rehearse_command.h"
 #include "tools/report/registry_commands.h"
 #include "tools/report/report_commands.h"
-#include "tools/shared/command_line.h"
 #include "tools/stat/stat_commands.h"
 #include "tools/whitelist/whitelist_commands.h"
 

@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -1,4 +1,4 @@
-// What each subcommand of tavrel-fleet gets: the database, and tools/shared/tool_output.h.
+// What each subcommand of tavrel-fleet gets: the database, and tools/console/tool_output.h.
 //
 //   void addShowCommand(Command top, FleetContext& context) {
 //     const Command show = top.addCommand("show", "Show one statistic");
@@ -14,7 +14,7 @@
 #include <string>
 
 #include "fleet/engine/open/open_engine.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel::fleet {
 

@@ -2,7 +2,7 @@
 
 #include "fleet/commands/question.h"
 #include "fleet/pages/fleet_page.h"
-#include "tools/shared/output_file.h"
+#include "tools/console/output_file.h"
 
 namespace tavrel::fleet {
 namespace {

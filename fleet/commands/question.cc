@@ -9,8 +9,8 @@
 #include "base/parse_number.h"
 #include "fleet/questions/day_range.h"
 #include "fleet/questions/grouping.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel::fleet {
 

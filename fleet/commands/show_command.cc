@@ -6,7 +6,7 @@
 #include "fleet/commands/question.h"
 #include "fleet/commands/show_output.h"
 #include "fleet/questions/summary.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -10,8 +10,8 @@
 #include "fleet/commands/csv_writer.h"
 #include "fleet/commands/question.h"
 #include "fleet/questions/merged_numbers.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel::fleet {
 

@@ -8,7 +8,7 @@
 #include "fleet/commands/csv_writer.h"
 #include "fleet/commands/question.h"
 #include "fleet/questions/summary.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel::fleet {
 namespace {

@@ -9,7 +9,7 @@
 #include "fleet/logs/record_digest.h"
 #include "fleet/sources/file_name.h"
 #include "fleet/sources/sources.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel::fleet {
 namespace {

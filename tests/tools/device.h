@@ -20,7 +20,7 @@
 #include "platform/plist/xml.h"
 #include "tests/devices/temporary_root.h"
 #include "tests/helpers/command_line.h"
-#include "tools/shared/json_value.h"
+#include "tools/console/json_value.h"
 #include "tools/tavrelctl.h"
 
 namespace tavrel {

@@ -7,7 +7,7 @@
 
 #include "brimhold/client.h"
 #include "device.h"
-#include "tools/shared/day_argument.h"
+#include "tools/console/day_argument.h"
 
 extern "C" int getpwnam_r(const char* name, passwd* entry, char* text, size_t size,
                           passwd** found) {

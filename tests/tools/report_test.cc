@@ -186,7 +186,8 @@ TEST_F(ReportTest, LeavesOutChannelsThatCannotBeSubtracted) {
   const Outcome changes =
       device.run("report sample --group NAND --delta --interval 0 --unit 4KiB --count 2");
   EXPECT_EQ(changes.error,
-            "tavrelctl: 1 channel without values: the recording has none here, or the hub does not "
+            "tavrelctl: 1 channel without values: the recording has none at this point, or the hub "
+            "does not "
             "know them\ntavrelctl: all channels have values again\ntavrelctl: 1 channel left out, "
             "as the change is "
             "unknown; the first is flash0 <id 0x100000201> NAND Traffic Host reads: the previous "
@@ -253,7 +254,8 @@ TEST_F(ReportTest, SaysWhatIsMissing) {
        subscribe + ": kIOReportUserClientConfigureInterests failed (0xe00002c5): 'tavrelctl "
                    "registry list' shows the drivers and the hub"},
       {forgetful, "sample", 0,
-       "1 channel without values: the recording has none here, or the hub does not know them"},
+       "1 channel without values: the recording has none at this point, or the hub does not know "
+       "them"},
       {badLegend, "list", 0,
        "radio0 <id 0x100000202>: bad legend\ntavrelctl: these drivers are left out: 'tavrelctl "
        "registry show ID' shows what they publish"},

@@ -3,9 +3,9 @@
 #include <limits>
 
 #include "device.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -9,7 +9,7 @@
 
 #include "base/format.h"
 #include "catalogue/catalogue.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

@@ -8,7 +8,7 @@
 #include "base/instant.h"
 #include "platform/platform.h"
 #include "tools/check/checks.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 

@@ -10,7 +10,7 @@
 #include "platform/linux/runs/upload_state.h"
 #include "platform/plist/coding.h"
 #include "tools/check/checks.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

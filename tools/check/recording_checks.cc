@@ -16,7 +16,7 @@
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
 #include "tools/check/checks.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 #include "tools/stat/recorded.h"
 
 namespace tavrel {

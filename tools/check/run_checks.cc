@@ -8,10 +8,10 @@
 #include "platform/linux/runs/last_run.h"
 #include "platform/persisted_state.h"
 #include "tools/check/checks.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/log/log_conclusion.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -16,7 +16,7 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "tools/check/checks.h"
 #include "tools/check/read_only.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

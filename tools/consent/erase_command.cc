@@ -12,8 +12,8 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
 #include "tools/consent/fold_everything.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

@@ -17,9 +17,9 @@
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
 #include "tools/consent/fold_everything.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/log/log_conclusion.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -7,7 +7,7 @@
 
 #include "base/format.h"
 #include "platform/linux/logs/submission_permission.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -11,7 +11,7 @@ namespace tavrel {
 
 struct PreferenceFault {
   std::string what;  // "preference Radio of domain com.norvane.da is a boolean, not 3"
-  std::string cure;  // the command that sets it rightly: "give 'tavrelctl prefs set ...'"
+  std::string cure;  // the command that sets it correctly: "give 'tavrelctl prefs set ...'"
 };
 
 /// Nothing when the value takes effect as that preference, or when the system does not know the

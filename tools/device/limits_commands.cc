@@ -10,8 +10,8 @@
 #include "platform/linux/limits/tidy.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

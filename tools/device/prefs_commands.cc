@@ -11,13 +11,13 @@
 #include "platform/persisted_state.h"
 #include "platform/plist/encodable_text.h"
 #include "platform/plist/xml.h"
+#include "tools/console/json_value.h"
+#include "tools/console/sorted_entries.h"
+#include "tools/console/table.h"
+#include "tools/console/typed_value.h"
+#include "tools/console/value_text.h"
 #include "tools/device/known_preferences.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/sorted_entries.h"
-#include "tools/shared/table.h"
-#include "tools/shared/typed_value.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -15,10 +15,10 @@
 #include "platform/linux/service/file_notifications.h"
 #include "platform/linux/service/service_client.h"
 #include "platform/linux/service/service_socket.h"
-#include "tools/shared/day_argument.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
+#include "tools/console/typed_value.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/table.h"
-#include "tools/shared/typed_value.h"
 
 namespace tavrel {
 namespace {

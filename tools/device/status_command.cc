@@ -12,9 +12,9 @@
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/persisted_state.h"
 #include "tools/check/check.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/log/log_conclusion.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -15,12 +15,12 @@
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/json_value.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/device/tasking_document.h"
-#include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

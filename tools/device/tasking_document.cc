@@ -10,9 +10,9 @@
 
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
+#include "tools/console/typed_value.h"
+#include "tools/console/value_text.h"
 #include "tools/device/known_preferences.h"
-#include "tools/shared/typed_value.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

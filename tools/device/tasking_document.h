@@ -1,4 +1,4 @@
-// A tasking as operators write it: a property list or JSON (tools/shared/json_value.h) of the form
+// A tasking as operators write it: a property list or JSON (tools/console/json_value.h) of the form
 //
 //   {"TaskingID": "fleet-7",
 //    "TaskingDigest": "5d41402a",

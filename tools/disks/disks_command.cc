@@ -9,8 +9,8 @@
 #include "base/iso_date.h"
 #include "base/quantity_text.h"
 #include "base/text.h"
+#include "tools/console/table.h"
 #include "tools/disks/disk_list.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

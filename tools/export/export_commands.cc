@@ -6,9 +6,9 @@
 
 #include "base/version.h"
 #include "platform/platform.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/output_file.h"
 #include "tools/export/exports.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/output_file.h"
 
 namespace tavrel {
 namespace {

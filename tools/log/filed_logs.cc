@@ -11,7 +11,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/log_file_name.h"
 #include "platform/plist/coding.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

@@ -16,15 +16,15 @@
 #include "platform/linux/logs/file_submission.h"
 #include "platform/plist/coding.h"
 #include "platform/tallied_log.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/log/filed_logs.h"
 #include "tools/log/log_conclusion.h"
 #include "tools/log/log_document.h"
 #include "tools/log/log_faults.h"
 #include "tools/log/log_list.h"
 #include "tools/log/log_preview.h"
-#include "tools/shared/day_argument.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -11,7 +11,7 @@
 #include "platform/linux/files/device_root.h"
 #include "platform/persisted_state.h"
 #include "platform/platform.h"
-#include "tools/shared/day_argument.h"
+#include "tools/console/day_argument.h"
 #include "tools/shared/input_file.h"
 
 namespace tavrel {

@@ -8,14 +8,14 @@
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/logs/log_day.h"
 #include "platform/tallied_log.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/json_value.h"
+#include "tools/console/sorted_entries.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/log/log_faults.h"
-#include "tools/shared/day_argument.h"
 #include "tools/shared/distribution_view.h"
 #include "tools/shared/error_figures.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/sorted_entries.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -4,7 +4,7 @@
 #include <string>
 
 #include "base/plist.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

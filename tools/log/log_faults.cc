@@ -6,8 +6,8 @@
 
 #include "base/format.h"
 #include "platform/tallied_log.h"
+#include "tools/console/value_text.h"
 #include "tools/shared/distribution_view.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -13,9 +13,9 @@
 #include "platform/linux/logs/log_day.h"
 #include "platform/plist/coding.h"
 #include "platform/tallied_log.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/log/filed_logs.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -15,11 +15,11 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "storage/parse/nand_log_writer.h"
+#include "tools/console/json_value.h"
+#include "tools/console/table.h"
 #include "tools/log/filed_logs.h"
 #include "tools/log/log_document.h"
 #include "tools/shared/error_figures.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -10,7 +10,7 @@
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "storage/parse/statistic_keys.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -18,6 +18,9 @@
 #include "storage/parse/asp_parser.h"
 #include "storage/parse/snapshot_record.h"
 #include "storage/vm_freezer.h"
+#include "tools/console/json_value.h"
+#include "tools/console/output_file.h"
+#include "tools/console/table.h"
 #include "tools/nand/nand_build.h"
 #include "tools/nand/nand_counters.h"
 #include "tools/nand/nand_derived.h"
@@ -25,10 +28,7 @@
 #include "tools/nand/nand_statistics.h"
 #include "tools/nand/nand_view.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/json_value.h"
 #include "tools/shared/noting_platform.h"
-#include "tools/shared/output_file.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

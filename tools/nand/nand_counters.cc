@@ -8,8 +8,8 @@
 #include <vector>
 
 #include "base/format.h"
+#include "tools/console/table.h"
 #include "tools/shared/distribution_view.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -4,7 +4,7 @@
 #include <string_view>
 
 #include "storage/telemetry_counters.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

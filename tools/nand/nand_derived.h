@@ -10,7 +10,7 @@
 
 #include "base/civil_time.h"
 #include "base/plist.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -8,8 +8,8 @@
 #include "base/format.h"
 #include "base/text.h"
 #include "storage/parse/statistic_keys.h"
-#include "tools/shared/json_list.h"
-#include "tools/shared/table.h"
+#include "tools/console/json_list.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

@@ -10,7 +10,7 @@
 
 #include "base/bytes.h"
 #include "storage/parse/asp_context.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -14,11 +14,11 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "storage/nand_info_keys.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/nand/nand_derived.h"
 #include "tools/shared/distribution_view.h"
 #include "tools/shared/error_figures.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -1,8 +1,8 @@
 #include "tools/overlay/overlay_drivers.h"
 
 #include "base/format.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -7,6 +7,7 @@
 #include "ioreport/ioreport.h"
 #include "page/charts.h"
 #include "page/number_text.h"
+#include "tools/console/table.h"
 #include "tools/page/sections.h"
 #include "tools/report/report_quantity.h"
 #include "tools/report/report_sampler.h"
@@ -53,7 +54,7 @@ std::vector<page::Share> sharesOf(const plist::Dictionary& channel) {
          time ? page::figureText(time->value, time->unit == "s" ? "seconds" : "") : std::string()});
   }
   if (states.count() > kStates) {
-    rest.label = format("%zu more states", states.count() - kStates);
+    rest.label = counted(states.count() - kStates, "more state");
     shares.push_back(std::move(rest));
   }
   return shares;

@@ -7,9 +7,9 @@
 #include "platform/linux/logs/submission_permission.h"
 #include "platform/linux/preferences/file_preferences.h"
 #include "platform/platform.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/page/sections.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

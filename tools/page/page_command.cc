@@ -11,10 +11,10 @@
 #include "platform/platform.h"
 #include "platform/plist/coding.h"
 #include "platform/tallied_log.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/output_file.h"
 #include "tools/log/log_preview.h"
 #include "tools/page/sections.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/output_file.h"
 
 namespace tavrel {
 namespace {

@@ -10,9 +10,9 @@
 #include "page/charts.h"
 #include "page/number_text.h"
 #include "page/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/page/sections.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
@@ -22,7 +22,7 @@ using page::shortNumber;
 
 constexpr SectionLimit kScalarLimit{1000, 350'000};
 constexpr SectionLimit kDistributionLimit{100, 350'000};
-// Intervals of the log shown per distribution; the others are summed up.
+// Intervals of the log shown per distribution, the fullest ones.
 constexpr std::size_t kIntervals = 64;
 
 // The text for the log's column, whatever the type of the value.
@@ -122,26 +122,18 @@ void writeDayHistogram(page::HtmlWriter& html, std::string_view key, const DayVa
   writeHistogram(html, histogram);
 }
 
-// The fullest intervals in their order, and all others as one.
-std::vector<page::Bar> barsOf(const std::vector<DistributionView::Bucket>& buckets) {
+// The fullest intervals, in their order.
+std::vector<page::Bar> barsOf(std::span<const DistributionView::Bucket> buckets) {
   std::vector<std::size_t> order(buckets.size());
   std::iota(order.begin(), order.end(), std::size_t{0});
   std::ranges::stable_sort(order, std::greater(), [&](std::size_t i) { return buckets[i].count; });
-  const std::size_t shown = std::min(order.size(), kIntervals);
-  std::ranges::sort(std::span(order).first(shown));
+  order.resize(std::min(order.size(), kIntervals));
+  std::ranges::sort(order);
   std::vector<page::Bar> bars;
-  double rest = 0;
-  for (std::size_t i = 0; i < order.size(); ++i) {
-    const auto& bucket = buckets[order[i]];
-    const auto count = static_cast<double>(bucket.count);
-    if (i < shown) {
-      bars.push_back({bucket.label, count, shortNumber(count)});
-    } else {
-      rest += count;
-    }
+  for (const std::size_t i : order) {
+    const auto count = static_cast<double>(buckets[i].count);
+    bars.push_back({buckets[i].label, count, shortNumber(count)});
   }
-  if (shown < order.size())
-    bars.push_back({format("%zu more intervals", order.size() - shown), rest, shortNumber(rest)});
   return bars;
 }
 
@@ -157,7 +149,14 @@ void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) 
                 : "In the log: count, range, mean and deviation, and how many values are in");
   html.end();
   const std::vector<page::Bar> bars = barsOf(leaving->buckets);
-  if (!bars.empty()) writeBars(html, format("Intervals of %s", leaving->key), bars);
+  if (bars.empty()) return;
+  writeBars(html, format("Intervals of %s", leaving->key), bars);
+  if (bars.size() < leaving->buckets.size()) {
+    html.begin("p", {{"class", "note leaves"}});
+    html.text(format("%s not shown, with as many values or fewer",
+                     counted(leaving->buckets.size() - bars.size(), "interval")));
+    html.end();
+  }
 }
 
 void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summary& summary,

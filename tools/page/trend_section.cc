@@ -8,9 +8,9 @@
 #include "page/charts.h"
 #include "page/number_text.h"
 #include "page/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/page/sections.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

@@ -6,11 +6,11 @@
 #include "base/format.h"
 #include "platform/plist/binary.h"
 #include "platform/plist/xml.h"
+#include "tools/console/json_value.h"
+#include "tools/console/output_file.h"
+#include "tools/console/typed_value.h"
+#include "tools/console/value_text.h"
 #include "tools/shared/input_file.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/output_file.h"
-#include "tools/shared/typed_value.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

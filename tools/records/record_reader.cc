@@ -11,9 +11,9 @@
 #include "platform/linux/files/descriptor.h"
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/files/system_error.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/json_value.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -18,11 +18,11 @@
 #include "platform/linux/files/file_system.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/record_file_name.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/json_list.h"
+#include "tools/console/table.h"
 #include "tools/records/folder_watch.h"
 #include "tools/records/record_reader.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/json_list.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {
@@ -144,7 +144,7 @@ class RecordsView {
     auto [reader, isNew] = readers_.try_emplace(file.path, file.path);
     const Status read =
         reader->second.read(!follows_, [&](std::string_view line, std::uint64_t number) {
-          // Editors begin a file with it, and no JSON document may contain it.
+          // Some editors begin a file with it, but a JSON document may not.
           constexpr std::string_view kByteOrderMark = "\xEF\xBB\xBF";
           if (line.starts_with(kByteOrderMark)) line.remove_prefix(kByteOrderMark.size());
           if (line.empty()) return;

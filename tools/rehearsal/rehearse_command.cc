@@ -10,11 +10,11 @@
 #include "base/format.h"
 #include "base/quantity_text.h"
 #include "platform/linux/linux_platform.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/json_value.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/rehearsal/rehearsal.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -9,10 +9,10 @@
 #include "platform/linux/recorded/recorded_registry.h"
 #include "platform/linux/recorded/recording.h"
 #include "platform/plist/xml.h"
+#include "tools/console/end_signals.h"
+#include "tools/console/table.h"
 #include "tools/report/playback.h"
 #include "tools/report/report_sampler.h"
-#include "tools/shared/end_signals.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 
@@ -28,7 +28,7 @@ plist::Dictionary recordLive(ToolContext& context, std::uint32_t seconds) {
                         std::string_view(servicesText.error().message)));
     return {};
   }
-  // Indented twice in the document.
+  // Deeper indentation in the document at most doubles it.
   Playback playback(limits::kPropertyListBytes -
                     std::min(limits::kPropertyListBytes, 2 * servicesText->size()));
   EndSignals signals;

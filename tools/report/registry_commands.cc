@@ -17,13 +17,13 @@
 #include "platform/linux/recorded/typed_fields.h"
 #include "platform/plist/xml.h"
 #include "platform/report_protocol.h"
+#include "tools/console/json_value.h"
+#include "tools/console/output_file.h"
+#include "tools/console/table.h"
+#include "tools/console/value_text.h"
 #include "tools/report/live_recording.h"
 #include "tools/report/report_selection.h"
-#include "tools/shared/json_value.h"
-#include "tools/shared/output_file.h"
 #include "tools/shared/subcommand.h"
-#include "tools/shared/table.h"
-#include "tools/shared/value_text.h"
 
 namespace tavrel {
 namespace {

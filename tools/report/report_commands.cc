@@ -12,6 +12,7 @@
 #include "base/format.h"
 #include "base/parse_number.h"
 #include "ioreport/ioreport.h"
+#include "tools/console/table.h"
 #include "tools/report/report_delta.h"
 #include "tools/report/report_json.h"
 #include "tools/report/report_sampler.h"
@@ -19,7 +20,6 @@
 #include "tools/report/report_view.h"
 #include "tools/shared/noting_platform.h"
 #include "tools/shared/subcommand.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

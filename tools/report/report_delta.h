@@ -15,9 +15,8 @@ struct SampleChanges {
   std::string firstLeftOut;  // "DRIVER GROUP SUBGROUP NAME: REASON"
 };
 
-/// Pairs channels by their identity. The system's own delta pairs them by position, and takes
-/// values since boot for the change of each channel for which it finds no earlier one: when one was
-/// absent before, of all that follow it.
+/// Pairs channels by their identity. The system's own delta pairs them by position: after a channel
+/// that was absent before, it finds no partner for any other, and leaves their values since boot.
 SampleChanges changesBetween(const plist::Dictionary& previous, const plist::Dictionary& current);
 
 }  // namespace tavrel

@@ -1,7 +1,7 @@
 #include "tools/report/report_failure.h"
 
 #include "base/format.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 

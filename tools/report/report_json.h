@@ -2,7 +2,7 @@
 #pragma once
 
 #include "base/plist.h"
-#include "tools/shared/json_list.h"
+#include "tools/console/json_list.h"
 
 namespace tavrel {
 

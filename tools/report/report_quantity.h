@@ -21,8 +21,8 @@ struct ConvertedValue {
 /// that cannot be converted.
 std::optional<ConvertedValue> convertedValue(const plist::Dictionary& channel, std::int64_t value);
 
-/// The time of which each state has its share. 0, which gives no state a share, when a change has a
-/// state that lasted less than nothing: its counter started over.
+/// The total of which each state has a share. 0, which leaves all without one, when the change of a
+/// state is negative: its counter started over.
 std::uint64_t residencyToShare(const Elements& states, bool isDelta);
 
 /// "309.7 GiB", "41.3 °C", "12.5 ms".

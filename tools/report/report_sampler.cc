@@ -80,7 +80,7 @@ std::int32_t Sampler::missing(const plist::Dictionary& samples) const {
 const char* Sampler::reasonForMissing() const {
   const bool isAnyLive = !context_.linuxPlatform().registry().liveServices().empty();
   return isAnyLive ? "their devices do not report them now, or the hub does not know them"
-                   : "the recording has none here, or the hub does not know them";
+                   : "the recording has none at this point, or the hub does not know them";
 }
 
 }  // namespace tavrel

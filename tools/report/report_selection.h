@@ -11,7 +11,7 @@
 #include "base/plist.h"
 #include "ioreport/ioreport.h"
 #include "platform/platform.h"
-#include "tools/shared/command.h"
+#include "tools/console/command.h"
 
 namespace tavrel {
 

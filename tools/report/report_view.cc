@@ -11,9 +11,9 @@
 #include "base/quantity_text.h"
 #include "ioreport/elements.h"
 #include "ioreport/ioreport.h"
+#include "tools/console/table.h"
 #include "tools/report/report_quantity.h"
 #include "tools/report/report_selection.h"
-#include "tools/shared/table.h"
 
 namespace tavrel {
 namespace {

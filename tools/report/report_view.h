@@ -2,7 +2,7 @@
 #pragma once
 
 #include "base/plist.h"
-#include "tools/shared/page.h"
+#include "tools/console/page.h"
 
 namespace tavrel {
 

@@ -6,7 +6,7 @@
 #include <limits>
 
 #include "platform/tallied_log.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

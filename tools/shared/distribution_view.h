@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "base/plist.h"
-#include "tools/shared/page.h"
+#include "tools/console/page.h"
 
 namespace tavrel {
 

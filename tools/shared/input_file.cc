@@ -11,7 +11,7 @@
 #include "platform/linux/files/system_error.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/plist/coding.h"
-#include "tools/shared/json_value.h"
+#include "tools/console/json_value.h"
 
 namespace tavrel {
 namespace {

@@ -17,7 +17,7 @@ inline constexpr const char* kWriteWhitelist = ": write a whitelist, as tavrel(8
 /// The content, at most `largest` bytes, of a file of this machine, or of standard input for "-".
 Expected<std::string> readInput(ToolContext& context, const std::string& file, std::size_t largest);
 
-/// Decodes a property list in either encoding, or JSON (tools/shared/json_value.h); recognises the
+/// Decodes a property list in either encoding, or JSON (tools/console/json_value.h); recognises the
 /// format from the content. The error begins with `name`.
 Expected<plist::Value> decodeDocument(std::string_view bytes, std::string_view name);
 

@@ -1,4 +1,4 @@
-// What each subcommand of tavrelctl gets: the device, and tools/shared/tool_output.h.
+// What each subcommand of tavrelctl gets: the device, and tools/console/tool_output.h.
 //
 // A group of subcommands registers itself with `void addXxxCommands(Command app, ToolContext&)`:
 //
@@ -21,7 +21,7 @@
 #include <string>
 #include <string_view>
 
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -8,7 +8,7 @@
 #include "base/limits.h"
 #include "base/parse_number.h"
 #include "base/utf8.h"
-#include "tools/shared/day_argument.h"
+#include "tools/console/day_argument.h"
 #include "tools/stat/import_number.h"
 
 namespace tavrel {

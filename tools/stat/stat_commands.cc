@@ -7,8 +7,8 @@
 #include <string>
 
 #include "platform/platform.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/output_file.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/output_file.h"
 #include "tools/shared/subcommand.h"
 #include "tools/stat/collect.h"
 #include "tools/stat/machine_statistics.h"

@@ -5,7 +5,7 @@
 
 #include "platform/linux/folding/segment_fold.h"
 #include "platform/linux/linux_platform.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 

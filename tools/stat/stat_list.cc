@@ -6,9 +6,9 @@
 #include <vector>
 
 #include "base/utf8.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/json_writer.h"
-#include "tools/shared/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/json_writer.h"
+#include "tools/console/table.h"
 #include "tools/stat/line_writer.h"
 #include "tools/stat/recorded.h"
 

@@ -12,7 +12,7 @@
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "platform/platform.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 #include "tools/stat/import_lines.h"
 #include "tools/stat/line_writer.h"
 #include "tools/stat/recorded.h"

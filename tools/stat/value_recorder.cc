@@ -149,8 +149,8 @@ Expected<std::unique_ptr<ValueRecorder>> openRecorder(ToolContext& context) {
                  folder)};
     case BHClientStatusUnsupported:
       return Error{
-          format("cannot record in %s: Linux is older than 4.14, or the path is too long: "
-                 "use 'tavrelctl stat import'",
+          format("cannot record in %s: Linux is older than 4.14, or the path is too long or "
+                 "relative to a folder that is gone: use 'tavrelctl stat import'",
                  folder)};
     case BHClientStatusFailed:
       return Error{

@@ -9,7 +9,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "config/bh_config.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/value_text.h"
 #include "tools/whitelist/whitelist_coarseness.h"
 #include "tools/whitelist/whitelist_model.h"
 #include "tools/whitelist/whitelist_rules.h"

@@ -8,7 +8,7 @@
 #include "base/format.h"
 #include "base/limits.h"
 #include "config/bh_config.h"
-#include "tools/shared/value_text.h"
+#include "tools/console/value_text.h"
 
 namespace tavrel {
 namespace {

@@ -9,8 +9,8 @@
 #include "config/bh_config.h"
 #include "platform/linux/store/sqlite_store.h"
 #include "report/histogram.h"
-#include "tools/shared/day_argument.h"
-#include "tools/shared/table.h"
+#include "tools/console/day_argument.h"
+#include "tools/console/table.h"
 #include "tools/whitelist/whitelist_model.h"
 #include "tools/whitelist/whitelist_rules.h"
 

@@ -6,8 +6,8 @@
 #include <set>
 #include <string_view>
 
-#include "tools/shared/json_value.h"
-#include "tools/shared/table.h"
+#include "tools/console/json_value.h"
+#include "tools/console/table.h"
 #include "tools/whitelist/whitelist_coarseness.h"
 #include "tools/whitelist/whitelist_model.h"
 #include "tools/whitelist/whitelist_rules.h"

@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "base/plist.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "tools/completion/scripts/completion_script.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -6,7 +6,7 @@
 #include <utility>
 #include <vector>
 
-#include "tools/shared/command_model.h"
+#include "tools/console/command_model.h"
 
 namespace tavrel {
 

@@ -5,8 +5,8 @@
 #include <string_view>
 
 #include "base/expected.h"
-#include "tools/shared/command_model.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/command_model.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -1,4 +1,4 @@
-#include "tools/shared/command_line.h"
+#include "tools/console/command_line.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -7,7 +7,7 @@
 #include <utility>
 
 #include "base/format.h"
-#include "tools/shared/word_list.h"
+#include "tools/console/word_list.h"
 
 namespace tavrel {
 namespace {

@@ -1,11 +1,11 @@
-#include "tools/shared/value_text.h"
+#include "tools/console/value_text.h"
 
 #include <ostream>
 
 #include "base/format.h"
 #include "base/text.h"
-#include "tools/shared/sorted_entries.h"
-#include "tools/shared/table.h"
+#include "tools/console/sorted_entries.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

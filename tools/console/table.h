@@ -8,7 +8,7 @@
 #include <utility>
 #include <vector>
 
-#include "tools/shared/page.h"
+#include "tools/console/page.h"
 
 namespace tavrel {
 

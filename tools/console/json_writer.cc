@@ -1,11 +1,11 @@
-#include "tools/shared/json_writer.h"
+#include "tools/console/json_writer.h"
 
 #include <algorithm>
 #include <charconv>
 #include <nlohmann/json.hpp>
 
 #include "base/utf8.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 namespace {

@@ -1,4 +1,4 @@
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 #include <algorithm>
 #include <numeric>

@@ -1,4 +1,4 @@
-#include "tools/shared/end_signals.h"
+#include "tools/console/end_signals.h"
 
 #include <algorithm>
 #include <cerrno>

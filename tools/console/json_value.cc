@@ -1,4 +1,4 @@
-#include "tools/shared/json_value.h"
+#include "tools/console/json_value.h"
 
 #include <cmath>
 #include <nlohmann/json.hpp>
@@ -9,7 +9,7 @@
 #include "base/iso_date.h"
 #include "base/limits.h"
 #include "base/text.h"
-#include "tools/shared/sorted_entries.h"
+#include "tools/console/sorted_entries.h"
 
 namespace tavrel {
 namespace {

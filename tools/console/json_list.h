@@ -10,8 +10,8 @@
 #include <iosfwd>
 #include <string_view>
 
-#include "tools/shared/json_writer.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/json_writer.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

@@ -8,8 +8,8 @@
 #include <string>
 #include <string_view>
 
-#include "tools/shared/command.h"
-#include "tools/shared/page.h"
+#include "tools/console/command.h"
+#include "tools/console/page.h"
 
 namespace tavrel {
 

@@ -1,4 +1,4 @@
-#include "tools/shared/page.h"
+#include "tools/console/page.h"
 
 #include "base/format.h"
 

@@ -5,7 +5,7 @@
 #include <string_view>
 
 #include "base/expected.h"
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 namespace tavrel {
 

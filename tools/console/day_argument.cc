@@ -1,4 +1,4 @@
-#include "tools/shared/day_argument.h"
+#include "tools/console/day_argument.h"
 
 #include <limits>
 

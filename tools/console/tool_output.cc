@@ -1,4 +1,4 @@
-#include "tools/shared/tool_output.h"
+#include "tools/console/tool_output.h"
 
 #include <cstdlib>
 #include <fcntl.h>
@@ -10,7 +10,7 @@
 
 #include "base/program.h"
 #include "platform/linux/system_log/linux_system_log.h"
-#include "tools/shared/table.h"
+#include "tools/console/table.h"
 
 namespace tavrel {
 namespace {

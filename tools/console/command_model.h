@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "tools/shared/command.h"
+#include "tools/console/command.h"
 
 namespace tavrel {
 

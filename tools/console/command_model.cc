@@ -1,4 +1,4 @@
-#include "tools/shared/command_model.h"
+#include "tools/console/command_model.h"
 
 #include <CLI/CLI.hpp>
 #include <sstream>

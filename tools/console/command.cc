@@ -1,4 +1,4 @@
-#include "tools/shared/command.h"
+#include "tools/console/command.h"
 
 #include <CLI/CLI.hpp>
 #include <algorithm>
@@ -12,7 +12,7 @@
 #include "base/ascii.h"
 #include "base/format.h"
 #include "base/parse_number.h"
-#include "tools/shared/word_list.h"
+#include "tools/console/word_list.h"
 
 namespace tavrel {
 namespace {

@@ -1,4 +1,4 @@
-#include "tools/shared/typed_value.h"
+#include "tools/console/typed_value.h"
 
 #include <algorithm>
 

@@ -1,4 +1,4 @@
-#include "tools/shared/json_list.h"
+#include "tools/console/json_list.h"
 
 #include <algorithm>
 #include <nlohmann/json.hpp>

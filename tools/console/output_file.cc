@@ -1,4 +1,4 @@
-#include "tools/shared/output_file.h"
+#include "tools/console/output_file.h"
 
 #include <cerrno>
 #include <filesystem>

@@ -1,4 +1,4 @@
-#include "tools/shared/word_list.h"
+#include "tools/console/word_list.h"
 
 namespace tavrel {
 
