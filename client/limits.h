@@ -28,8 +28,9 @@ enum {
   kFilesBeforeFold = 256,
 
   /* Beyond that, one in this many new segments asks, and the clock decides which. A fold leaves the
-   * files of live processes; when these alone exceed the number, each new program would start a
-   * fold in vain. A prime, which clocks that advance by a round number of nanoseconds reach too. */
+   * files of live processes; when these alone exceed the number, each new program would otherwise
+   * start a fold in vain. A prime, so that clocks that advance by a round number of nanoseconds hit
+   * it, too. */
   kSegmentsPerFold = 127,
 
   /* Names tried for a new file. They contain a time in nanoseconds; a collision means that a

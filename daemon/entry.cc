@@ -1,5 +1,6 @@
 #include "daemon/entry.h"
 
+#include <cstdint>
 #include <string_view>
 
 #include "base/arithmetic.h"
@@ -52,21 +53,19 @@ void serve(Platform& platform, std::chrono::milliseconds idleSlice) {
   runDailyIfNeeded(platform, plist::Array());
 }
 
-void run(Platform& platform, RunKind kind, std::chrono::milliseconds idleSlice) {
+void run(Platform& platform, RunKind kind, std::int32_t today) {
   const plist::Array noAppInfo;
-  const auto today = [&] { return platform.statistics->BHDaysSince1970(); };
   switch (kind) {
     case RunKind::Daily:
       runDailyIfNeeded(platform, noAppInfo);
       break;
     case RunKind::Forced:
-      dailyTasksForDay(platform, previousDay(today()), noAppInfo);
+      dailyTasksForDay(platform, previousDay(today), noAppInfo);
       break;
     case RunKind::Today:
-      dailyTasksForDay(platform, today(), noAppInfo);
+      dailyTasksForDay(platform, today, noAppInfo);
       break;
     case RunKind::Service:
-      serve(platform, idleSlice);
       break;
   }
 }
@@ -94,11 +93,11 @@ int runTavrel(Platform& platform, std::span<const char* const> arguments,
               std::chrono::milliseconds idleSlice) {
   platform.log->log(LogLevel::Default, "tavrel started");
   runGuarded(platform.log, "finish the run", [&] {
-    if (const auto kind = runKindOf(arguments)) {
-      run(platform, *kind, idleSlice);
-    } else if (!arguments.empty()) {
-      answer(platform, arguments[1]);
-    }
+    const auto kind = runKindOf(arguments);
+    if (kind == RunKind::Service) return serve(platform, idleSlice);
+    if (arguments.empty()) return;
+    const std::int32_t today = platform.statistics->BHDaysSince1970();
+    kind ? run(platform, *kind, today) : answer(platform, arguments[1]);
   });
   platform.log->log(LogLevel::Default, "tavrel ended");
   return 0;

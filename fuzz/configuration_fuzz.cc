@@ -3,7 +3,6 @@
 //
 // Input: a byte that chooses the file; a byte that, when odd, means that the property list is built
 // from what follows; the content.
-#include <algorithm>
 #include <vector>
 
 #include "base/limits.h"

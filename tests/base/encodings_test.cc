@@ -2,6 +2,7 @@
 #include <gtest/gtest.h>
 
 #include "base/base64.h"
+#include "base/instant.h"
 #include "base/iso_date.h"
 #include "base/keyed_hash.h"
 
@@ -26,6 +27,7 @@ TEST(Base64, RefusesWrongLengthsAndPadding) {
 }
 
 TEST(Dates, AreReadAsTheyAreWritten) {
+  EXPECT_EQ(dayOf(plist::Date::since1970(-0.5)), -1);
   for (const double seconds :
        {0.0, -1.5, -0.25, 1e-7, 978307200.125, -3e12, 253402300800.0, 1e15}) {
     const auto date = plist::Date::sinceEpoch(seconds);

@@ -1,7 +1,6 @@
 // A device on which programs record and folds run.
 #pragma once
 
-#include <algorithm>
 #include <cstdlib>
 #include <set>
 

@@ -189,7 +189,9 @@ TEST_F(DailyRunTest, TakesItsModeFromTheFirstArgument) {
   EXPECT_EQ(fake.log.messages()[1], "daily tasks for day 20000");
 
   for (const char* unknown : {"-D", "", "-x", "-dd", " -d"}) {
+    fake.store.daysAsked = 0;
     run({"tavrel", unknown});
+    EXPECT_EQ(fake.store.daysAsked, 1);
     EXPECT_EQ(fake.journal, fakes::Journal{});
     EXPECT_EQ(fake.log.messages()[1], std::string("Unknown arg: ") + unknown);
   }

@@ -98,8 +98,12 @@ struct FakeStore : StatisticsStore {
   std::set<std::string> keysRead;  // distributions whose values were read
   bool keepsValues = true;
   bool scalarsAreReadable = true, distributionsAreReadable = true;
+  int daysAsked = 0;
 
-  std::int32_t BHDaysSince1970() override { return today; }
+  std::int32_t BHDaysSince1970() override {
+    ++daysAsked;
+    return today;
+  }
   plist::Date dateForDaysSince1970(std::int32_t day) override { return plist::Date::ofDay(day); }
   bool BHClientCheckpoint() override {
     journal.push_back("checkpoint");

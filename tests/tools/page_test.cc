@@ -97,10 +97,9 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
   EXPECT_LT(size.size(), 2'000'000U);
   const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
   const std::string text = textOf("--days 400");
-  expectIn(text,
-           {"(1, 2] 2 (7, 8] 2", "(69, 70] 2 6 intervals not shown, with as many values or fewer ",
-            "Not shown for lack of space: 50 distributions; " + day + " has them all",
-            "1330 statistics more without a chart"});
+  expectIn(text, {"(1, 2] 2 (7, 8] 2", "(69, 70] 2 6 more intervals with 6 values together ",
+                  "Not shown for lack of space: 50 distributions; " + day + " has them all",
+                  "1330 statistics more without a chart"});
   EXPECT_EQ(countOf(text, "lack of space: (\\d+) (scalars|statistics);"), 2);
 }
 

@@ -151,12 +151,17 @@ void writeLogHistogram(page::HtmlWriter& html, const DistributionView* leaving) 
   const std::vector<page::Bar> bars = barsOf(leaving->buckets);
   if (bars.empty()) return;
   writeBars(html, format("Intervals of %s", leaving->key), bars);
-  if (bars.size() < leaving->buckets.size()) {
-    html.begin("p", {{"class", "note leaves"}});
-    html.text(format("%s not shown, with as many values or fewer",
-                     counted(leaving->buckets.size() - bars.size(), "interval")));
-    html.end();
-  }
+  const std::size_t more = leaving->buckets.size() - bars.size();
+  if (more == 0) return;
+  double rest = 0;
+  for (const auto& bucket : leaving->buckets)
+    rest += static_cast<double>(bucket.count);
+  for (const page::Bar& bar : bars)
+    rest -= bar.value;
+  html.begin("p", {{"class", "note leaves"}});
+  html.text(
+      format("%s with %s values together", counted(more, "more interval"), shortNumber(rest)));
+  html.end();
 }
 
 void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summary& summary,

@@ -1,6 +1,5 @@
 #include "tools/whitelist/whitelist_diff.h"
 
-#include <algorithm>
 #include <nlohmann/json.hpp>
 #include <ostream>
 #include <set>
