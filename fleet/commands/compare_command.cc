@@ -50,7 +50,7 @@ std::string leftOutText(const CompareAnswer& answer) {
   add(answer.missing, "without logs of both versions on these days");
   add(answer.tooFew, "of fewer than " + std::to_string(answer.devicesAtLeast) +
                          " devices, or close to a set that was shown");
-  add(answer.unfit, "whose mean or deviation is not finite in one version");
+  add(answer.unfit, "whose mean or deviation a double cannot hold in one version");
   return text.empty() ? text : "Left out:\n" + text;
 }
 

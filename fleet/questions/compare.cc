@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <array>
 #include <atomic>
+#include <bit>
 #include <cmath>
 #include <exception>
 #include <functional>
@@ -44,16 +45,23 @@ struct Sample {
     logs.insert(log);
     isEmpty = false;
     moments.add(value);
+    note(std::bit_cast<std::uint64_t>(value));
   }
   void add(LogIndex log, const FiveNumbers& numbers) {
     logs.insert(log);
     isEmpty = false;
     if (hasMean(numbers)) {
       moments.add(numbers.mean);
+      note(std::bit_cast<std::uint64_t>(numbers.mean + 0.0));  // 0 has one sign
     } else {
       if (!withoutMean) withoutMean.emplace(table);
       withoutMean->insert(log);
     }
+  }
+
+  void note(std::uint64_t value) {
+    if (!first) first = value;
+    varies = varies || value != *first;
   }
 
   const LogTable& table;
@@ -61,6 +69,8 @@ struct Sample {
   std::optional<LogMarks> withoutMean;
   bool isEmpty = true;
   ExactMoments moments;
+  std::optional<std::uint64_t> first;  // the bits of the first value
+  bool varies = false;
 };
 
 /// If devices have m1, m2, ... logs, the mean of all n logs is at least as certain as that of n² /
@@ -94,7 +104,10 @@ struct SideResult {
   std::shared_ptr<const LogSet> withMean;  // the same set when all logs have a mean
   std::optional<Measured> measured;
 };
-using KeyResult = std::array<SideResult, 2>;
+struct KeyResult {
+  std::array<SideResult, 2> sides;
+  double difference;  // of the means: after - before
+};
 
 std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
                                 const LogSet& withMean) {
@@ -105,7 +118,9 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
   side.devices = withMean.devices(sample.table);
   side.mean = sample.moments.mean();
   const double squared = sample.moments.squaredDeviations();
-  if (side.logs == 0 || !std::isfinite(squared)) return std::nullopt;
+  // Deviations below the smallest double would make the mean look certain.
+  const bool isTooSmall = squared == 0 && sample.varies;
+  if (side.logs == 0 || !std::isfinite(squared) || isTooSmall) return std::nullopt;
   const auto logs = static_cast<double>(side.logs);
   result.independent = independentValues(withMean.logsByDay(sample.table));
   if (result.independent <= 1) return std::nullopt;
@@ -115,13 +130,24 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
   return result;
 }
 
-/// Welch's test: the variances of the two sides may differ.
-Comparison comparisonOf(const Key& key, const Measured& before, const Measured& after) {
+/// The squared error of the difference of two means, if both sides have the same variance.
+double pooledSquaredError(const Measured& a, const Measured& b) {
+  const double degreesOfFreedom = a.independent + b.independent - 2;
+  const double variance =
+      ((a.independent - 1) * a.variance + (b.independent - 1) * b.variance) / degreesOfFreedom;
+  return variance * (1 / a.independent + 1 / b.independent);
+}
+
+/// Welch's test: the variances of the two sides may differ. But when a side with few values has the
+/// smaller variance, that may be chance, as with a rare event that none of its devices had. So the
+/// error is not taken for smaller than it is if the sides do not differ at all.
+Comparison comparisonOf(const Key& key, double difference, const Measured& before,
+                        const Measured& after) {
   Comparison result;
   result.key = key;
   result.before = before.side;
   result.after = after.side;
-  result.difference = after.side.mean - before.side.mean;
+  result.difference = difference;
   if (before.side.mean != 0) result.relative = result.difference / std::abs(before.side.mean);
   const double squaredError = before.squaredError + after.squaredError;
   if (squaredError == 0) {
@@ -134,7 +160,7 @@ Comparison comparisonOf(const Key& key, const Measured& before, const Measured& 
     return share * share / (one.independent - 1);
   };
   const double degreesOfFreedom = 1 / (term(before) + term(after));
-  const double error = std::sqrt(squaredError);
+  const double error = std::sqrt(std::max(squaredError, pooledSquaredError(before, after)));
   result.effect = result.difference / std::sqrt((before.variance + after.variance) / 2);
   result.margin = studentQuantile(1 - kConfidenceLevel, degreesOfFreedom) * error;
   result.pValue = studentTwoSided(result.difference / error, degreesOfFreedom);
@@ -190,7 +216,7 @@ class Comparer {
         ++answer.missing;
         continue;
       }
-      const auto& [before, after] = *results_[i];
+      const auto& [before, after] = results_[i]->sides;
       const std::string subject = subjectOf(keys_[i].kind, keys_[i].name);
       const std::string means = subjectOfMeans(keys_[i].kind, keys_[i].name);
       const auto isAllowed = [&](const SideResult& side) {
@@ -205,11 +231,12 @@ class Comparer {
         ++answer.unfit;
         continue;
       }
-      for (const SideResult& side : *results_[i]) {
+      for (const SideResult& side : results_[i]->sides) {
         ledger.noteShown(subject, *side.logs);
         ledger.noteShown(means, *side.withMean);
       }
-      answer.comparisons.push_back(comparisonOf(keys_[i], *before.measured, *after.measured));
+      answer.comparisons.push_back(
+          comparisonOf(keys_[i], results_[i]->difference, *before.measured, *after.measured));
     }
     return answer;
   }
@@ -237,7 +264,9 @@ class Comparer {
     }
     const auto& [before, after] = samples;
     if (before.isEmpty || after.isEmpty) return nullptr;
-    return std::make_unique<KeyResult>(KeyResult{resultOf(before), resultOf(after)});
+    return std::make_unique<KeyResult>(
+        KeyResult{{resultOf(before), resultOf(after)},
+                  ExactMoments::differenceOfMeans(before.moments, after.moments)});
   }
 
   SideResult resultOf(const Sample& sample) {

@@ -82,6 +82,32 @@ double ExactMoments::mean() const {
   return nearestQuotient(magnitude, count_, kLastBit, isNegative);
 }
 
+double ExactMoments::differenceOfMeans(const ExactMoments& before, const ExactMoments& after) {
+  std::uint64_t pairs = 0;
+  if (before.count_ == 0 || after.count_ == 0 || before.overflowed_ || after.overflowed_ ||
+      __builtin_mul_overflow(before.count_, after.count_, &pairs)) {
+    return kNan;
+  }
+  // (sum after × count before - sum before × count after) / pairs
+  std::array<std::uint64_t, kSumLimbs + 1> sums[2] = {};  // positive and negative terms
+  const auto addTo = [](auto& result, const auto& limbs, std::uint64_t count) {
+    Uint128 carry = 0;
+    for (std::size_t i = 0; i < kSumLimbs; ++i) {
+      carry += static_cast<Uint128>(limbs[i]) * count + result[i];
+      result[i] = lowHalf(carry);
+      carry >>= 64;
+    }
+    result[kSumLimbs] += lowHalf(carry);
+  };
+  addTo(sums[0], after.sum_.positive(), before.count_);
+  addTo(sums[0], before.sum_.negative(), after.count_);
+  addTo(sums[1], after.sum_.negative(), before.count_);
+  addTo(sums[1], before.sum_.positive(), after.count_);
+  std::array<std::uint64_t, kSumLimbs + 1> magnitude;
+  const bool isNegative = subtract(sums[0], sums[1], magnitude);
+  return nearestQuotient(magnitude, pairs, kLastBit, isNegative);
+}
+
 double ExactMoments::squaredDeviations() const {
   if (count_ == 0 || overflowed_) return kNan;
 

@@ -4,6 +4,7 @@
 // true values, whatever the order of the terms.
 #pragma once
 
+#include <cstddef>
 #include <cstdint>
 
 #include "fleet/questions/wide_sum.h"
@@ -23,6 +24,10 @@ class ExactMoments {
 
   /// The mean of all values. Not-a-number without values, or when the count overflowed.
   double mean() const;
+
+  /// The mean of `after`'s values less that of `before`'s, rounded once. Not-a-number when one of
+  /// the means is, or when there are 2^64 pairs of values.
+  static double differenceOfMeans(const ExactMoments& before, const ExactMoments& after);
 
   /// The sum of squared deviations from `mean()`, not divided by the count. Not-a-number when the
   /// mean is.

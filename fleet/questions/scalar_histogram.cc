@@ -6,6 +6,16 @@
 
 namespace tavrel::fleet {
 
+namespace {
+
+// Exact, for whole numbers as boundaries: not every value has a double.
+bool isBelow(double boundary, std::int64_t value) {
+  if (boundary < -0x1p63) return true;
+  return boundary < 0x1p63 && static_cast<std::int64_t>(boundary) < value;
+}
+
+}  // namespace
+
 std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
   constexpr double kBuckets = 10;
   constexpr double kBeyond = 3;  // buckets on each side
@@ -40,8 +50,7 @@ std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
 
 Cell bucketOf(std::span<const double> boundaries, std::int64_t value) {
   constexpr double kInfinity = std::numeric_limits<double>::infinity();
-  const auto upper =
-      std::lower_bound(boundaries.begin(), boundaries.end(), static_cast<double>(value));
+  const auto upper = std::lower_bound(boundaries.begin(), boundaries.end(), value, isBelow);
   return {upper == boundaries.begin() ? -kInfinity : *(upper - 1),
           upper == boundaries.end() ? kInfinity : *upper, 1};
 }

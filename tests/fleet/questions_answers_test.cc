@@ -483,7 +483,8 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
       record.scalars.push_back({"same", 5});
       record.scalars.push_back({isNew ? "new" : "old", 1});
       record.distributions = {{"key8", {0, 1, noise(random) - (isNew ? 20 : 0), 5, 9}},
-                              {"odd", {0, 0, std::nan(""), 0, 1}}};
+                              {"odd", {0, 0, std::nan(""), 0, 1}},
+                              {"tiny", {0, 1, device * 5e-172, 0, 1}}};
       if (device < 2) record.distributions[0].numbers.mean = std::nan("");
       if (device < 10) record.scalars.push_back({"rare", 1});
     }
@@ -498,7 +499,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   EXPECT_EQ(answer.comparisons.size(), 43u);
   EXPECT_EQ(answer.missing, 2u);
   EXPECT_EQ(answer.tooFew, 1u);
-  EXPECT_EQ(answer.unfit, 1u);
+  EXPECT_EQ(answer.unfit, 2u);
   EXPECT_EQ(answer.comparisons[1].after.logsWithoutMean, 3u);  // key8 of one device
   EXPECT_EQ(answer.comparisons[1].after.logs, 297u);
   const Comparison& slower = answer.comparisons[2];
@@ -508,6 +509,25 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   EXPECT_NEAR(slower.margin, 2.79, 0.15);
   EXPECT_EQ(answer.comparisons[0].effect, std::nullopt);
   EXPECT_EQ(answer.comparisons.back().effect, 0);
+}
+
+// A rare event that none of ten devices had, but one of ten did before.
+TEST(CompareTest, TakesNoFewEqualValuesForCertain) {
+  TestFleet fleet;
+  for (int device = 0; device < 310; ++device) {
+    fleet.add(0, device < 10 ? "2" : "1").scalars = {
+        {"rare", device % 10 == 0 && device > 9 ? 1 : 0}, {"moved", device < 10 ? 5 : device % 3}};
+  }
+  Ledger& ledger = fleet.ledger(10);
+  const auto answer = compare(fleet.engine(), ledger, {"1", "2", {}});
+  const Comparison& moved = answer.comparisons.at(0);
+  EXPECT_EQ(moved.key.name, "moved");
+  EXPECT_TRUE(moved.isSignificant());
+  const Comparison& rare = answer.comparisons.at(1);
+  EXPECT_EQ(rare.difference, -0.1);
+  // The error is the root of 299 / 308 × 0.1 × 0.9 × 300 / 299 × (1 / 300 + 1 / 10).
+  EXPECT_NEAR(rare.margin, 1.968 * 0.09519, 2e-4);
+  EXPECT_NEAR(rare.pValue, 0.2943, 5e-4);
 }
 
 // Each device reports often and always the same. If its logs counted as independent values, they

@@ -80,6 +80,20 @@ TEST(ExactMomentsTest, TakeIntegersWithoutLoss) {
   EXPECT_EQ(moments.mean(), 0x1p+52);  // (2^54 + 1 - 1) / 4
 }
 
+TEST(ExactMomentsTest, RoundDifferencesOfMeansOnlyOnce) {
+  ExactMoments before, after;
+  EXPECT_TRUE(std::isnan(ExactMoments::differenceOfMeans(before, after)));
+  for (const std::int64_t value : {INT64_MAX - 5, INT64_MAX - 4, INT64_MAX - 4})
+    before.add(value);
+  for (const std::int64_t value : {INT64_MAX, INT64_MAX - 1})
+    after.add(value);
+  EXPECT_EQ(ExactMoments::differenceOfMeans(before, after), 23 / 6.0);
+  EXPECT_EQ(ExactMoments::differenceOfMeans(after, before), -23 / 6.0);
+  before.add(-0x1p1000, 0, 1);
+  after.add(0x1p1000, 0, 1);
+  EXPECT_EQ(ExactMoments::differenceOfMeans(before, after), 0x1p1000 * 7 / 12);
+}
+
 TEST(MergedNumbersTest, KeepTheEndsInAnyOrder) {
   std::vector<FiveNumbers> all = {{0.0, 2, 1, 2, 2},        {-0.0, kInfinity, 1, 0, 1},
                                   {0, 0, 0, 0, 0},          {kNan, kNan, kNan, kNan, 1},
@@ -134,6 +148,11 @@ TEST(HistogramTest, DividesScalarsAtRoundNumbers) {
   EXPECT_EQ(bucketOf(boundaries, 100), (Cell{0, 100, 1}));
   EXPECT_EQ(bucketOf(boundaries, INT64_MIN), (Cell{-kInfinity, 0, 1}));
   EXPECT_EQ(bucketOf(boundaries, 1001), (Cell{1000, kInfinity, 1}));
+  // Values that have no double of their own.
+  const double large[] = {-0x1p63, 0x1p62, 0x1p63};
+  EXPECT_EQ(bucketOf(large, (std::int64_t{1} << 62) + 1), (Cell{0x1p62, 0x1p63, 1}));
+  EXPECT_EQ(bucketOf(large, INT64_MAX), (Cell{0x1p62, 0x1p63, 1}));
+  EXPECT_EQ(bucketOf(large, INT64_MIN), (Cell{-kInfinity, -0x1p63, 1}));
   const std::int64_t extremes[] = {INT64_MIN, INT64_MAX};
   EXPECT_LT(roundBoundaries(extremes).size(), 30u);
   const std::int64_t alike[] = {INT64_MAX, INT64_MAX};
