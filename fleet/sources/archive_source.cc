@@ -50,7 +50,14 @@ class Archive {
     if (!failure_.empty()) return nullptr;
     archive_entry* entry = nullptr;
     const int code = archive_read_next_header(archive_.get(), &entry);
-    if (code == ARCHIVE_EOF) return nullptr;
+    if (code == ARCHIVE_EOF) {
+      // A file that stops after a member gives the same code as the end mark, but nothing is read
+      // from where the next header should be.
+      if (archive_filter_bytes(archive_.get(), 0) == archive_read_header_position(archive_.get())) {
+        failure_ = "its end mark is missing: it may be cut short";
+      }
+      return nullptr;
+    }
     if (code != ARCHIVE_OK && code != ARCHIVE_WARN) return note(), nullptr;
     // Count skipped members as well: they are expanded, too.
     if (archive_filter_bytes(archive_.get(), 0) > most_ || archive_entry_size(entry) > most_) {

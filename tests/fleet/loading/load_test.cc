@@ -191,12 +191,22 @@ TEST_F(LoadTest, TakesArchives) {
   write("first.log", sampleLog(5));
   write("first.metadata.plist", kMetadata);
   const std::size_t content = (sampleLog(5).size() + 511) / 512 * 512;
-  shell(format("tar -cf early.tar first.log first.metadata.plist && head -c %zu early.tar > e.tar",
-               512 + content + 100));
-  EXPECT_NE(run({at("e.tar")})
-                .error.find(
-                    "refused: e.tar: first.log: its metadata may be in the rest of the archive\n"),
-            std::string::npos);
+  shell("tar -cf early.tar first.log first.metadata.plist");
+  for (const auto& [bytes, reason] :
+       {std::pair(512 + content, "its end mark is missing: it may be cut short"),
+        std::pair(512 + content + 100, "the rest cannot be read: ")}) {
+    shell(format("head -c %zu early.tar | tee e.tar | gzip > e.tgz", bytes));
+    for (const std::string name : {"e.tar", "e.tgz"}) {
+      const std::string refused = "tavrel-fleet: refused: " + name + ": ";
+      const std::string error = run({at(name)}).error;
+      EXPECT_TRUE(error.starts_with(refused +
+                                    "first.log: its metadata may be in the rest of the archive\n" +
+                                    refused + reason))
+          << error;
+    }
+  }
+  shell(format("head -c %zu early.tar > e.tar", 512 + content + 512 + 512 + 512));
+  EXPECT_EQ(run({at("e.tar")}).out, "1 loaded, 0 known, 0 refused\n") << "half of the end mark";
   // A file of one gigabyte in an archive of a few kilobytes.
   shell("truncate -s 1G big.log && tar -cSf bomb.tar big.log");
   EXPECT_EQ(run({at("bomb.tar")}).error,
