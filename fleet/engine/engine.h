@@ -77,7 +77,8 @@ class Engine {
 
   struct Appended {
     std::size_t added = 0;
-    std::size_t known = 0;  // logs that were there before, or twice among the records
+    std::size_t known = 0;    // logs that were there before, or twice among the records
+    std::vector<bool> isNew;  // of each record: whether it was added
   };
 
   /// Files each record whole or not at all, even when the process is killed. Several loaders may

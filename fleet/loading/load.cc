@@ -34,7 +34,7 @@ class Loading {
   /// `isMoreRead`: whether another item is available without waiting.
   Status take(ReadItem item, bool isMoreRead) {
     if (item.record) {
-      if (!item.source.metadata) ++counts_.withoutMetadata;
+      hasMetadata_.push_back(item.source.metadata.has_value());
       batch_.push_back(*std::move(item.record));
       batchBytes_ += item.bytes;
       if (batch_.size() == kBatchLogs || batchBytes_ >= kBatchBytes ||
@@ -70,7 +70,11 @@ class Loading {
     const Engine::Appended appended = engine_.append(batch_);
     counts_.loaded += appended.added;
     counts_.known += appended.known;
+    for (std::size_t i = 0; i < batch_.size(); ++i) {
+      if (appended.isNew[i] && !hasMetadata_[i]) ++counts_.withoutMetadata;
+    }
     batch_.clear();
+    hasMetadata_.clear();
     batchBytes_ = 0;
     listener_.progress(counts_);
   }
@@ -79,6 +83,7 @@ class Loading {
   const LoadListener& listener_;
   std::optional<SetAside> setAside_;
   std::vector<LogRecord> batch_;
+  std::vector<bool> hasMetadata_;  // of each record in `batch_`
   std::size_t batchBytes_ = 0;
   LoadCounts counts_;
 };

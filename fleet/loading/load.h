@@ -26,7 +26,7 @@ struct LoadCounts {
   std::size_t refused = 0;
   std::size_t others = 0;           // logs of another kind
   std::size_t tooNew = 0;           // left to the next load: their metadata may still follow
-  std::size_t withoutMetadata = 0;  // loaded or known, and nothing says their OS version
+  std::size_t withoutMetadata = 0;  // of those loaded: they never get an OS version
 };
 
 struct LoadListener {

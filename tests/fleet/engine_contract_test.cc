@@ -80,11 +80,15 @@ TEST_P(EngineContract, CountsALogOnceInWhateverOrderAndPortionsItComes) {
   const auto engine = openOther();
   std::shuffle(records.begin(), records.end(), std::mt19937(5));
   records.push_back(std::move(fullRecords(1, 3).front()));
-  for (const auto& [first, count, known] :
-       {std::array<std::size_t, 3>{0, 1, 0}, {0, 4, 1}, {4, 600, 0}, {500, 201, 105}}) {
+  for (const auto& [first, count, before, twice] :
+       {std::array<std::size_t, 4>{0, 1, 0, 0}, {0, 4, 1, 0}, {4, 600, 0, 0}, {500, 201, 104, 1}}) {
     const auto appended = engine->append(std::span(records).subspan(first, count));
-    EXPECT_EQ(appended.known, known);
-    EXPECT_EQ(appended.added, count - known);
+    EXPECT_EQ(appended.known, before + twice);
+    EXPECT_EQ(appended.added, count - before - twice);
+    std::vector<bool> isNew(before, false);
+    isNew.resize(count - twice, true);
+    isNew.resize(count, false);
+    EXPECT_EQ(appended.isNew, isNew);
   }
   EXPECT_EQ(rowsIn(*engine->reader()), expected);
 }

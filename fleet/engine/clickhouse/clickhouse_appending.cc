@@ -47,7 +47,11 @@ Engine::Appended ClickhouseAppending::append(std::span<const LogRecord> records)
     }
     insertPortion(std::span(fresh).subspan(begin, end - begin));
   }
-  return {fresh.size(), records.size() - fresh.size()};
+  Engine::Appended result{fresh.size(), records.size() - fresh.size(),
+                          std::vector<bool>(records.size())};
+  for (const LogRecord* record : fresh)
+    result.isNew[static_cast<std::size_t>(record - records.data())] = true;
+  return result;
 }
 
 void ClickhouseAppending::readKeys() {

@@ -48,7 +48,8 @@ Engine::Appended Appending::append(std::span<const LogRecord> records) {
   names_.refresh();
   continueLastBlock();
   for (const LogRecord& record : records) {
-    if (!insertLog(record)) {
+    result.isNew.push_back(insertLog(record));
+    if (!result.isNew.back()) {
       ++result.known;
       continue;
     }
