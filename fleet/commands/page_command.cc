@@ -1,5 +1,8 @@
 #include "fleet/commands/page_command.h"
 
+#include <filesystem>
+
+#include "base/format.h"
 #include "fleet/commands/question.h"
 #include "fleet/pages/fleet_page.h"
 #include "tools/console/output_file.h"
@@ -23,6 +26,12 @@ void addPageCommand(Command top, FleetContext& context) {
   command.onRun([&context, options] {
     if (const Status usable = checkOutput(options->output); !usable) {
       return context.fail(usable.error().message);
+    }
+    // Where no path leads to the database, it is on a server.
+    std::error_code missing;
+    if (std::filesystem::equivalent(options->output, context.database(), missing)) {
+      return context.failUsage(
+          format("--output: %s is the database: name another file", options->output));
     }
     ask(context, *options, [&](Question& question) {
       const std::string text =

@@ -350,6 +350,7 @@ TEST_F(QuestionCommands, SayWhatIsWrong) {
   const std::string few =
       " is in no log, or in logs of fewer than 10 devices: tavrel-fleet summary";
   const std::tuple<CommandLine, int, std::string> cases[] = {
+      {{"page", "-o", file}, 2, "--output: " + file + " is the database: name another file"},
       {"show x\x1b", 1, "statistic \"x\\x1b\"" + few + " --keys lists the statistics"},
       {{"show", ""}, 2, "KEY: must not be empty: see 'tavrel-fleet show --help'"},
       {{"compare", "", "4.9"}, 2, "OLD: must not be empty: see 'tavrel-fleet compare --help'"},
