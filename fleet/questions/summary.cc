@@ -20,6 +20,18 @@ CountedGroup countedGroup(const Ledger& ledger, const PartName& name, const LogS
   return result;
 }
 
+bool hasValues(const ScalarValue&) {
+  return true;
+}
+
+bool hasValues(const DistributionValue& row) {
+  return row.numbers.count != 0;
+}
+
+bool hasValues(const CellValue& row) {
+  return row.count != 0;
+}
+
 }  // namespace
 
 bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const Key& key) {
@@ -27,6 +39,7 @@ bool hasEnough(Engine& engine, const Ledger& ledger, const LogSet& among, const 
   DeviceCounter logs(table);
   const auto take = [&](const auto& rows) {
     for (const auto& row : rows) {
+      if (!hasValues(row)) continue;
       const LogIndex log = table.find(row.log);
       if (log != kNoLog && among.contains(log)) logs.insert(log);
     }

@@ -349,15 +349,16 @@ struct CountedRows : Engine {
   Appended append(std::span<const LogRecord>) override { return {}; }
   void logs(std::int32_t, std::int32_t, const Visitor<LogRow>&) override {}
   std::vector<Key> keys() override { return {}; }
-  void scalars(std::string_view, const Visitor<ScalarValue>& visit) override { give(visit); }
+  void scalars(std::string_view, const Visitor<ScalarValue>& visit) override { give(visit, {}); }
   void distributions(std::string_view, const Visitor<DistributionValue>& visit) override {
-    give(visit);
+    give(visit, {.numbers = {.count = values}});
   }
-  void cells(std::string_view, const Visitor<CellValue>& visit) override { give(visit); }
+  void cells(std::string_view, const Visitor<CellValue>& visit) override {
+    give(visit, {.count = values});
+  }
   std::unique_ptr<Engine> reader() override { return nullptr; }
   template <class Row>
-  void give(const Visitor<Row>& visit) {
-    Row row;
+  void give(const Visitor<Row>& visit, Row row) {
     rows = 0;
     try {
       while (rows < 24) {
@@ -369,6 +370,7 @@ struct CountedRows : Engine {
     }
   }
   LogId rows = 0;
+  std::uint64_t values = 1;  // of each distribution and each bucket
 };
 
 TEST(SummaryTest, ReadsNoFurtherThanToEnoughDevices) {
@@ -384,6 +386,9 @@ TEST(SummaryTest, ReadsNoFurtherThanToEnoughDevices) {
     EXPECT_FALSE(hasEnough(engine, fleet.ledger(13), all, {"k", kind}));
     EXPECT_EQ(engine.rows, 24U);
   }
+  engine.values = 0;
+  EXPECT_FALSE(hasEnough(engine, ledger, all, {"k", KeyKind::Distribution}));
+  EXPECT_FALSE(hasEnough(engine, ledger, all, {"k", KeyKind::Histogram}));
 }
 
 TEST(PrivacyTest, APageSaysWhichDaysItJoins) {
