@@ -98,7 +98,10 @@ void writeChart(page::HtmlWriter& html, const CompareAnswer& comparison) {
       ++unchanged;
       continue;
     }
-    if (!one.relative || !std::isfinite(one.margin)) continue;
+    if (!one.relative || !std::isfinite(one.margin)) {
+      if (!one.isSignificant()) ++unchanged;
+      continue;
+    }
     const double scale = 100 / std::abs(one.before.mean);
     chart.rows.push_back({labelOf(comparison, one), (one.difference - one.margin) * scale,
                           one.difference * scale, (one.difference + one.margin) * scale,

@@ -461,13 +461,19 @@ TEST(CompareTest, PutsSmallChangesInWords) {
   EXPECT_EQ(changeText(one), "lower (5 → 5)");
 }
 
-TEST(CompareTest, SaysWhenTheVersionsShareNoStatistic) {
+TEST(CompareTest, SaysWhatItCannotShow) {
   FleetPage facts;
   facts.comparison.emplace();
   page::HtmlWriter html;
   writeInShort(html, facts);
   EXPECT_THAT(std::string(html.written()),
               testing::HasSubstr(", no statistic could be compared.<"));
+  Comparison same;  // on both sides 0, so its change is no share of the mean before
+  same.adjustedPValue = 1;
+  facts.comparison->comparisons = {same, same};
+  writeChanges(html, *facts.comparison);
+  EXPECT_THAT(std::string(html.written()),
+              testing::HasSubstr(">2 more statistics without a change beyond chance.<"));
 }
 
 TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
