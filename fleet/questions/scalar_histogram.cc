@@ -28,11 +28,13 @@ std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
 
   double step = 1;
   const double wanted = (high - low) / kBuckets;
-  for (double power = 1; step < wanted; power *= 10) {
+  double power = 1;
+  while (step < wanted) {
     for (const double factor : {1.0, 2.0, 5.0, 10.0}) {
       step = factor * power;
       if (step >= wanted) break;
     }
+    power *= 10;
   }
   std::vector<double> boundaries;
   // No bucket lies entirely outside the range of the values.
@@ -40,10 +42,11 @@ std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
   const auto largest = static_cast<double>(ascending.back());
   const double first = std::max(std::floor(low / step) - kBeyond, std::floor(smallest / step));
   const double last = std::min(std::ceil(high / step) + kBeyond, std::ceil(largest / step));
-  for (double i = first; i <= last; i += 1) {
+  const int steps = static_cast<int>(last - first);
+  for (int i = 0; i <= steps; ++i) {
+    const double boundary = (first + i) * step;
     // Beyond 2^53, neighbouring multiples can be the same number.
-    if (boundaries.empty() || boundaries.back() < i * step) boundaries.push_back(i * step);
-    if (i + 1 == i) break;
+    if (boundaries.empty() || boundaries.back() < boundary) boundaries.push_back(boundary);
   }
   return boundaries;
 }
@@ -51,8 +54,10 @@ std::vector<double> roundBoundaries(std::span<const std::int64_t> ascending) {
 Cell bucketOf(std::span<const double> boundaries, std::int64_t value) {
   constexpr double kInfinity = std::numeric_limits<double>::infinity();
   const auto upper = std::lower_bound(boundaries.begin(), boundaries.end(), value, isBelow);
-  return {upper == boundaries.begin() ? -kInfinity : *(upper - 1),
-          upper == boundaries.end() ? kInfinity : *upper, 1};
+  Cell bucket{-kInfinity, kInfinity, 1};
+  if (upper != boundaries.begin()) bucket.lower = *(upper - 1);
+  if (upper != boundaries.end()) bucket.upper = *upper;
+  return bucket;
 }
 
 }  // namespace tavrel::fleet
