@@ -109,9 +109,8 @@ void SimulatedDevice::record(std::int32_t day) {
     store.scalars.emplace_back(key, day, std::llround(value));
   };
   const auto series = [&](const char* key, double count, const auto& next) {
-    std::vector<double> values;
-    for (double i = 0; i < count; i += 1)
-      values.push_back(next());
+    std::vector<double> values(static_cast<std::size_t>(std::max(std::ceil(count), 0.0)));
+    std::ranges::generate(values, next);
     store.distributions.emplace_back(key, day, std::move(values));
   };
 

@@ -21,9 +21,10 @@ std::string textOf(const plist::Dictionary& dictionary, std::string_view key) {
 }
 
 void setOption(LogMetadata& metadata, std::string_view key, std::string value) {
-  if (key == kConfigNumberOption) metadata.configNumber = std::move(value);
-  // The first log of a device says here that there was no earlier version.
-  else if (key == kPreviousOSVersionOption && value != kNoVersion) {
+  if (key == kConfigNumberOption) {
+    metadata.configNumber = std::move(value);
+  } else if (key == kPreviousOSVersionOption && value != kNoVersion) {
+    // The first log of a device says here that there was no earlier version.
     metadata.previousOsVersion = std::move(value);
   }
 }

@@ -217,7 +217,7 @@ TEST_F(FoldTest, WhatWaitsIsSeenAsAFoldWouldLeaveIt) {
   constexpr std::int64_t days[] = {kToday, kToday - 400, 2'932'896, kToday};
   const pid_t child = start([&] {
     for (int round = 0; round < 4; ++round) {
-      testClock().realtime = days[round] * 86'400 + (round % 2) * 86'399;
+      testClock().realtime = days[round] * 86'400 + (round % 2) * std::int64_t{86'399};
       for (int i = 0; i < 2500; ++i)  // more than are read at once
         record(round * 10'000 + i);
       add(10);
