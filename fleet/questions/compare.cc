@@ -118,14 +118,14 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
   side.devices = withMean.devices(sample.table);
   side.mean = sample.moments.mean();
   const double squared = sample.moments.squaredDeviations();
-  // Deviations below the smallest double would make the mean look certain.
-  const bool isTooSmall = squared == 0 && sample.varies;
-  if (side.logs == 0 || !std::isfinite(squared) || isTooSmall) return std::nullopt;
+  if (side.logs == 0 || !std::isfinite(squared)) return std::nullopt;
   const auto logs = static_cast<double>(side.logs);
   result.independent = independentValues(withMean.logsByDay(sample.table));
   if (result.independent <= 1) return std::nullopt;
   result.variance = squared / logs * (result.independent / (result.independent - 1));
   result.squaredError = result.variance / result.independent;
+  // Deviations below the smallest double would make the mean look certain.
+  if (result.squaredError == 0 && sample.varies) return std::nullopt;
   side.deviation = std::sqrt(result.variance);
   return result;
 }
@@ -133,9 +133,10 @@ std::optional<Measured> measure(const Sample& sample, const LogSet& logSet,
 /// The squared error of the difference of two means, if both sides have the same variance.
 double pooledSquaredError(const Measured& a, const Measured& b) {
   const double degreesOfFreedom = a.independent + b.independent - 2;
-  const double variance =
-      ((a.independent - 1) * a.variance + (b.independent - 1) * b.variance) / degreesOfFreedom;
-  return variance * (1 / a.independent + 1 / b.independent);
+  const auto part = [&](const Measured& one) {
+    return one.variance * ((one.independent - 1) / degreesOfFreedom);
+  };
+  return (part(a) + part(b)) * (1 / a.independent + 1 / b.independent);
 }
 
 /// Welch's test: the variances of the two sides may differ. But when a side with few values has the

@@ -58,8 +58,7 @@ struct CompareAnswer {
   std::vector<Comparison> comparisons;
   std::size_t missing = 0;  // keys that at most one version has
   std::size_t tooFew = 0;   // keys for which one version has too few devices
-  std::size_t unfit =
-      0;  // keys for which one version has no mean, or no deviation that a double holds
+  std::size_t unfit = 0;    // keys for which one version has no mean or no measurable deviation
 };
 
 /// Reads the keys one by one, in two threads. Throws EngineError.

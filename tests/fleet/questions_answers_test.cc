@@ -495,6 +495,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
       record.scalars.push_back({isNew ? "new" : "old", 1});
       record.distributions = {{"key8", {0, 1, noise(random) - (isNew ? 20 : 0), 5, 9}},
                               {"odd", {0, 0, std::nan(""), 0, 1}},
+                              {"small", {0, 1, device % 3 * 2e-162, 0, 1}},
                               {"tiny", {0, 1, device * 5e-172, 0, 1}}};
       if (device < 2) record.distributions[0].numbers.mean = std::nan("");
       if (device < 10) record.scalars.push_back({"rare", 1});
@@ -510,7 +511,7 @@ TEST(CompareTest, FindsWhatChangedAndOnlyThat) {
   EXPECT_EQ(answer.comparisons.size(), 43u);
   EXPECT_EQ(answer.missing, 2u);
   EXPECT_EQ(answer.tooFew, 1u);
-  EXPECT_EQ(answer.unfit, 2u);
+  EXPECT_EQ(answer.unfit, 3u);
   EXPECT_EQ(answer.comparisons[1].after.logsWithoutMean, 3u);  // key8 of one device
   EXPECT_EQ(answer.comparisons[1].after.logs, 297u);
   const Comparison& slower = answer.comparisons[2];
