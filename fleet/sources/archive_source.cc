@@ -29,6 +29,9 @@ class Archive {
   explicit Archive(const std::string& path) : archive_(archive_read_new()) {
     if (!archive_) throw std::bad_alloc();
     archive_read_support_format_tar(archive_.get());
+    // Archives may follow one another, as `cat` joins them: the first end mark must not hide the
+    // rest.
+    archive_read_set_format_option(archive_.get(), "tar", "read_concatenated_archives", "1");
     archive_read_support_filter_gzip(archive_.get());
     archive_read_support_filter_bzip2(archive_.get());
     archive_read_support_filter_xz(archive_.get());

@@ -169,6 +169,8 @@ TEST_F(LoadTest, TakesArchives) {
   write("in/d/e.metadata.plist", "<plist>");
   std::filesystem::create_symlink("a.log", at("in/d/link.log"));
   shell("tar -cf all.tar -C in d && tar -czf all.tgz -C in d && head -c 2000 all.tar > cut.tar");
+  shell(
+      "cd in && tar -cf a.tar d/a.* && tar -cf b.tar --exclude='a.*' d && cat ?.tar > ../all.tar");
   const Outcome alone = run({at("in/d/e.log")});
   EXPECT_EQ(alone.out, "0 loaded, 0 known, 1 refused\n");
   EXPECT_NE(alone.error.find("e.log: its metadata: "), std::string::npos) << alone.error;
