@@ -133,8 +133,8 @@ TEST_F(TaskingTest, SchedulesShowsAndClears) {
                  R"({"TaskingID": "t3", "TaskingDigest": ")" + std::string(1U << 20, 'x') + "\"}");
   EXPECT_EQ(large.status, 1);
   EXPECT_EQ(large.out, "");
-  device.check("tasking clear",
-               prints("Removed scheduled tasking t2. Settings already applied stay in force.\n"));
+  device.check("tasking clear", prints("Removed scheduled tasking t2. Settings already applied "
+                                       "stay; aggressive submission ends.\n"));
   EXPECT_TRUE(device.run("tasking show").out.starts_with("Scheduled tasking: none\n"));
 }
 

@@ -101,9 +101,9 @@ ReadsBeforeErasure
 TEST_F(NandInfo, AFailureIsNoZero) {
   device.check("nand info",
                fails("Could not get matching Kernkit service for exporting classes\ntavrelctl: no "
-                     "NAND information: Unable to parse buffer: put a recording of the storage "
-                     "driver into " +
-                     device.path("/var/lib/tavrel/registry")));
+                     "NAND information: Unable to parse buffer: no storage driver is recorded in " +
+                     device.path("/var/lib/tavrel/registry") +
+                     "; see 'tavrelctl disks' for this machine's drives"));
   record(device, built(device, R"([["hostWrites", 1]])"));
   device.check("nand info",
                fails("no NAND information: Unsupported export version: see what the driver answers "

@@ -183,7 +183,7 @@ void clear(ToolContext& context) {
   }
   if (!store(context, {})) return;
   context.out() << "Removed scheduled tasking " << printable(text(taskings.scheduled.identifier))
-                << ". Settings already applied stay in force.\n";
+                << ". Settings already applied stay; aggressive submission ends.\n";
 }
 
 }  // namespace

@@ -73,8 +73,10 @@ void info(ToolContext& context, const Arguments& arguments) {
   const bool hasDriver = findNandExporter(noting.platform().drivers, exporter) != nullptr;
   const std::string advice = hasDriver
                                  ? "see what the driver answers with 'tavrelctl registry show ID'"
-                                 : format("put a recording of the storage driver into %s",
-                                          context.root().path(kRecordingFolder));
+                                 : format(
+                                       "no storage driver is recorded in %s; see 'tavrelctl "
+                                       "disks' for this machine's drives",
+                                       context.root().path(kRecordingFolder));
   context.fail(format("no NAND information: %s: %s",
                       info.string(kNANDInfoErrorMessageKey).value_or(""), advice));
 }
