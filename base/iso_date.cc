@@ -76,6 +76,8 @@ std::string isoDateText(plist::Date instant) {
   const double seconds = instant.secondsSinceEpoch();
   const double fraction = seconds - std::floor(seconds);
   if (fraction == 0) return text;
+  // Just before the epoch: the difference is rounded.
+  if (fraction == 1) return isoDateText(plist::Date::sinceEpoch(std::floor(seconds) + 1));
   char digits[1100];
   const auto [end, error] =
       std::to_chars(digits, digits + sizeof digits, fraction, std::chars_format::fixed);

@@ -33,6 +33,7 @@ TEST(Dates, AreReadAsTheyAreWritten) {
     const auto date = plist::Date::sinceEpoch(seconds);
     EXPECT_EQ(*parseIsoDate(isoDateText(date)), date) << isoDateText(date);
   }
+  EXPECT_EQ(isoDateText(plist::Date::sinceEpoch(-1e-17)), "2001-01-01T00:00:00Z");
   for (const std::string_view text :
        {"", "2026-13-01", "2026-11-16T24:00:00Z", "2026-11-16T10:00:00", "2026-11-16T10:00:00.5.Z",
         "2026-11-16T10:00:00.-5Z", "2026-11-16T1:00:00Z", "@", "@x"})

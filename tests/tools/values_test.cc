@@ -53,7 +53,11 @@ TEST(JsonValue, RefusesWhatAPropertyListCannotHold) {
        "JSON/x: \"$data\" must be the only member of its object, and a string"},
       {R"({"$data": "AA==", "$$data": "QUJD"})",
        "JSON/$$data: \"$data\" must be the only member of its object, and a string"},
-      {std::string(1000, '1'), "number overflow parsing '" + std::string(275, '1') + "..."},
+      {std::string(1000, '1'),
+       "JSON at column 1000: number overflow parsing '" + std::string(254, '1') + "..."},
+      {"[1,\n 1e999]", "JSON at line 2, column 6: number overflow parsing '1e999'"},
+      {R"([1, {"a": [2, {"$data": "?"}]}])", "JSON/1/a/1/$data: \"$data\" is not base64"},
+      {std::string(128, '[') + "{}", "JSON: nested too deeply"},
       {R"({"$x": 1})", "JSON/$x: \"$x\" is not a known form: write a key that begins with $ as $$"},
       {std::string(200, '['), "JSON: nested too deeply"}};
   for (const auto& [text, message] : kCases) {

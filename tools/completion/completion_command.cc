@@ -7,6 +7,7 @@
 
 #include "base/arithmetic.h"
 #include "base/civil_time.h"
+#include "catalogue/catalogue.h"
 #include "platform/linux/linux_platform.h"
 #include "platform/linux/logs/file_submission.h"
 #include "platform/linux/preferences/file_preferences.h"
@@ -51,6 +52,15 @@ void listDays(ToolContext& context) {
   }
 }
 
+void listCatalogue(ToolContext& context) {
+  for (const auto kind :
+       {catalogue::Kind::Statistic, catalogue::Kind::Channel, catalogue::Kind::Controller}) {
+    for (const catalogue::Entry& entry : catalogue::entries(kind)) {
+      if (entry.key.find_first_of("<*") == std::string_view::npos) printWord(context, entry.key);
+    }
+  }
+}
+
 void listDomains(ToolContext& context) {
   const auto domains = context.preferences().domains();
   if (!domains) return context.fail(domains.error().message);
@@ -75,6 +85,7 @@ CompletedProgram completedProgram(const Command& program) {
           .lists = {{"DAY", "days"}, {"KEY", "keys"}, {"PREFIX", "keys"}, {"DOMAIN", "domains"}},
           // Keys of preferences are not keys of statistics.
           .exceptions = {{"prefs", "KEY", "none"},
+                         {"catalogue", "KEY", "catalogue"},
                          {"log show", "FILE", "logs"},
                          {"whitelist diff", "OLD", "files"},
                          {"whitelist diff", "NEW", "files"}}};
@@ -86,6 +97,7 @@ void addCompletionCommand(Command program, ToolContext& context) {
   addCompletion(program, context, completedProgram,
                 {{"keys", [&context] { listKeys(context); }},
                  {"days", [&context] { listDays(context); }},
+                 {"catalogue", [&context] { listCatalogue(context); }},
                  {"domains", [&context] { listDomains(context); }},
                  {"logs", [&context] { listLogs(context); }}});
 }

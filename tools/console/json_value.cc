@@ -1,5 +1,6 @@
 #include "tools/console/json_value.h"
 
+#include <algorithm>
 #include <cmath>
 #include <nlohmann/json.hpp>
 #include <vector>
@@ -71,22 +72,27 @@ bool isSpecial(std::string_view key) {
   return key == kDataMember || key == kDateMember || key == kRealMember;
 }
 
+/// "line 2, column 4"; the line is left out when there is only one.
+std::string placeText(std::string_view text, std::size_t position) {
+  const std::string_view before = text.substr(0, position);
+  const std::size_t lineEnd = before.rfind('\n');
+  const std::size_t column = lineEnd == std::string_view::npos ? position : position - lineEnd - 1;
+  if (text.find('\n') == std::string_view::npos) return format("column %zu", column);
+  return format("line %td, column %zu", 1 + std::ranges::count(before, '\n'), column);
+}
+
 /// "not JSON at line 2, column 4: invalid literal", from "[TAG] parse error at line 2, column 4:
-/// syntax error while parsing value - invalid literal; last read: 'no'". The line is left out when
-/// there is only one, and other messages lose only their tag.
-std::string inOurWords(std::string_view words, bool isOneLine) {
+/// syntax error while parsing value - invalid literal; last read: 'no'". Other messages lose their
+/// tag: "JSON at line 2, column 4: number overflow parsing '1e999'".
+std::string inOurWords(std::string_view words, const std::string& place) {
   const std::size_t tag = words.find("] ");
   if (tag != std::string_view::npos) words.remove_prefix(tag + 2);
   constexpr std::string_view kAt = "parse error at ";
-  constexpr std::string_view kFirstLine = "line 1, ";
   constexpr std::string_view kDash = " - ";
-  const std::size_t colon = words.find(": ");
   const std::size_t dash = words.find(kDash);
-  if (!words.starts_with(kAt) || colon > dash || dash == std::string_view::npos) {
-    return std::string(words);
+  if (!words.starts_with(kAt) || dash == std::string_view::npos) {
+    return format("JSON at %s: %s", place, words);
   }
-  std::string_view place = words.substr(kAt.size(), colon - kAt.size());
-  if (isOneLine && place.starts_with(kFirstLine)) place.remove_prefix(kFirstLine.size());
   const std::string_view reason = words.substr(dash + kDash.size());
   return format("not JSON at %s: %s", place, reason.substr(0, reason.find(';')));
 }
@@ -95,7 +101,7 @@ std::string inOurWords(std::string_view words, bool isOneLine) {
 /// that nests too deeply is refused before anything recurses over it.
 class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
  public:
-  explicit ValueBuilder(bool isOneLine) : isOneLine_(isOneLine) {}
+  explicit ValueBuilder(std::string_view text) : text_(text) {}
 
   plist::Value takeResult() { return std::move(result_); }
   const std::string& message() const { return message_; }
@@ -116,8 +122,12 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   bool string(string_t& value) override { return add(std::string_view(value)); }
   bool binary(binary_t&) override { return fail("unexpected bytes"); }
 
-  bool start_object(std::size_t) override { return open(plist::Dictionary::create()); }
+  // The object of a special form stands for a value that is no container, so it is no level.
+  bool start_object(std::size_t) override {
+    return open(plist::Dictionary::create(), limits::kPropertyListDepth + 1);
+  }
   bool key(string_t& value) override {
+    if (isBelowDeepest() && !isSpecial(value)) return failAtDepth();
     levels_.back().key = value;
     return true;
   }
@@ -133,32 +143,46 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
       auto meant = valueOfSpecial(only.key, *text);
       if (!meant) return fail(meant.error().message);
       value = *std::move(meant);
+      --count_;
+    } else if (isBelowDeepest()) {
+      return failAtDepth();
     }
     levels_.pop_back();
     return add(std::move(value));
   }
-  bool start_array(std::size_t) override { return open(plist::Array::create()); }
+  bool start_array(std::size_t) override {
+    return open(plist::Array::create(), limits::kPropertyListDepth);
+  }
   bool end_array() override {
     plist::Value value = std::move(levels_.back().container);
     levels_.pop_back();
     return add(std::move(value));
   }
 
-  bool parse_error(std::size_t, const std::string&, const nlohmann::detail::exception& e) override {
-    message_ = inOurWords(e.what(), isOneLine_);
+  bool parse_error(std::size_t position, const std::string&,
+                   const nlohmann::detail::exception& e) override {
+    message_ = inOurWords(e.what(), placeText(text_, position));
     return false;
   }
 
  private:
   struct Level {
     plist::Value container;
-    std::string key;  // of the next member
-    std::size_t members = 0;
-    bool isSpecial = false;  // a member with one of the special names was seen
+    std::string key;          // of the next member
+    std::size_t members = 0;  // or elements
+    bool isSpecial = false;   // a member with one of the special names was seen
   };
 
-  bool open(plist::Value container) {
-    if (levels_.size() == limits::kPropertyListDepth) return fail("nested too deeply");
+  bool isBelowDeepest() const { return levels_.size() > limits::kPropertyListDepth; }
+
+  // A path of so many levels would be cut off before the reason.
+  bool failAtDepth() {
+    levels_.clear();
+    return fail("nested too deeply");
+  }
+
+  bool open(plist::Value container, std::size_t mostLevels) {
+    if (levels_.size() == mostLevels) return failAtDepth();
     levels_.push_back({std::move(container), {}});
     return true;
   }
@@ -170,12 +194,12 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
       return true;
     }
     Level& level = levels_.back();
+    ++level.members;
     if (auto array = level.container.array()) {
       array.append(std::move(value));
       return true;
     }
     auto object = level.container.dictionary();
-    ++level.members;
     std::string_view key = level.key;
     if (isSpecial(key)) {
       level.isSpecial = true;
@@ -191,7 +215,11 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
   bool fail(std::string_view what) {
     message_ = "JSON";
     for (const Level& level : levels_) {
-      if (!level.key.empty()) appendFormat(message_, "/%s", level.key);
+      if (level.container.array()) {
+        appendFormat(message_, "/%zu", level.members);
+      } else if (!level.key.empty()) {
+        appendFormat(message_, "/%s", level.key);
+      }
     }
     appendFormat(message_, ": %s", what);
     return false;
@@ -199,7 +227,7 @@ class ValueBuilder final : public nlohmann::json_sax<nlohmann::json> {
 
   std::vector<Level> levels_;
   plist::Value result_;
-  const bool isOneLine_;
+  const std::string_view text_;
   std::string message_;
   std::size_t count_ = 0;
 };
@@ -247,7 +275,7 @@ Json jsonOf(const plist::Value& value) {
 }
 
 Expected<plist::Value> parseJsonValue(std::string_view text) {
-  ValueBuilder builder(text.find('\n') == std::string_view::npos);
+  ValueBuilder builder(text);
   if (!nlohmann::json::sax_parse(text.begin(), text.end(), &builder)) {
     return Error{shortened(builder.message())};
   }

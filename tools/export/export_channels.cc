@@ -80,16 +80,20 @@ class ChannelExport {
       page_.gauge(family(name, help), labels, converted->value);
   }
 
+  // Leaves out unsigned counts that are negative as signed ones.
   void addStates() {
     const std::int32_t count = IOReportStateGetCount(channel_);
     const plist::Array names = stateNames(channel_);
     for (std::int32_t state = 0; state < count; ++state) {
       const auto name = names.at(static_cast<std::size_t>(state)).string();
       const MetricLabels labels = with("state", name ? std::string(*name) : std::to_string(state));
-      addValue("tavrel_channel_state", "How long states of channels have lasted.", labels,
-               IOReportStateGetResidency(channel_, state));
+      const std::int64_t residency = IOReportStateGetResidency(channel_, state);
+      if (residency >= 0) {
+        addValue("tavrel_channel_state", "How long states of channels have lasted.", labels,
+                 residency);
+      }
       const std::int64_t entries = IOReportStateGetInTransitions(channel_, state);
-      if (entries == kInvalidValue) continue;
+      if (entries < 0) continue;
       page_.gauge(
           {"tavrel_channel_state_entries", "", "How often states of channels were entered."},
           labels, entries);

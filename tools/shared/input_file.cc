@@ -36,6 +36,7 @@ Expected<std::string> readStream(std::istream& in, std::string_view name, std::s
 
 // A property list in either encoding begins with other characters.
 bool looksLikeJson(std::string_view bytes) {
+  if (bytes.starts_with("\xEF\xBB\xBF")) bytes.remove_prefix(3);
   const std::size_t first = bytes.find_first_not_of(" \t\r\n");
   return first != std::string_view::npos &&
          std::string_view("{[\"-0123456789tfn").find(bytes[first]) != std::string_view::npos;

@@ -70,20 +70,19 @@ bool coarsensNoScalar(const plist::Dictionary& options) {
 }
 
 std::string optionsText(const plist::Dictionary& options, bool isScalar) {
-  std::string text;
-  const auto append = [&](std::string_view name) {
-    const auto value = options.get(name);
-    if (!value) return;
-    if (!text.empty()) text += ", ";
-    text += format("%s %s", name, inlineText(value));
-  };
-  if (isScalar) {
-    append(kBucketIntervalOption);
-    append(kSignificantFiguresOption);
-    return text.empty() ? "reported unchanged" : text;
+  if (!isScalar) {
+    const plist::Array intervals = options.array(kIntervalsOption);
+    if (!intervals || intervals.size() > limits::kHistogramBoundaries) return "summary only";
+    return format("summary and histogram, %s %s", kIntervalsOption, inlineText(intervals));
   }
-  append(kIntervalsOption);
-  return text.empty() ? "summary only" : "summary and histogram, " + text;
+  std::string text;
+  for (const std::string_view name : {kBucketIntervalOption, kSignificantFiguresOption}) {
+    const auto number = options.number(name);
+    if (!number) continue;
+    if (!text.empty()) text += ", ";
+    appendFormat(text, "%s %u", name, number->uint32());
+  }
+  return text.empty() ? "reported unchanged" : text;
 }
 
 }  // namespace tavrel

@@ -28,6 +28,7 @@ constexpr std::int64_t kFewBuckets = 8;
 struct Shown {
   std::int64_t values = 0;
   std::int64_t notNumbers = 0;
+  std::int64_t finite = 0;
   std::int64_t buckets = 0;  // buckets that are not empty; 0 without a histogram
 
   Shown(BHHistoryDistributionEnumerator& enumerator, const plist::Dictionary& options) {
@@ -38,6 +39,7 @@ struct Shown {
     while (enumerator.getNextValue(value, second)) {
       ++values;
       notNumbers += std::isnan(value) ? 1 : 0;
+      finite += std::isfinite(value) ? 1 : 0;
       if (histogram) histogram->count(value);
     }
     if (histogram) {
@@ -58,11 +60,11 @@ class DataCheck {
     const std::string which = format("%s on %s", key, dayDateText(day));
     const std::string counts = counted(static_cast<std::uint64_t>(shown.values), "value");
     if (shown.notNumbers > 0) {
-      add(*rule, format("%s: %lld of %s make mean and deviation nan, as they are not numbers: fix "
-                        "the program that records them",
-                        which, shown.notNumbers, counts));
+      add(*rule, format("%s: mean and deviation are nan, as %lld of %s %s not a number: fix the "
+                        "program that records it",
+                        which, shown.notNumbers, counts, shown.notNumbers == 1 ? "is" : "are"));
     }
-    if (shown.values > 0 && shown.values <= kKnownFromSummary) {
+    if (shown.values > 0 && shown.values <= kKnownFromSummary && shown.finite == shown.values) {
       add(*rule, format("%s: minimum, maximum, mean and deviation are exact and reveal %s", which,
                         shown.values == 1 ? "its only value" : "each of its " + counts));
     } else if (shown.buckets >= kFewBuckets && 2 * shown.buckets > shown.values) {
