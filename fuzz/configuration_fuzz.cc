@@ -3,6 +3,7 @@
 //
 // Input: a byte that chooses the file; a byte that, when odd, means that the property list is built
 // from what follows; the content.
+#include <cmath>
 #include <vector>
 
 #include "base/limits.h"
@@ -111,13 +112,27 @@ void readSystem(Device& device) {
   }
 }
 
+// The files have whole seconds.
+bool isSameSecond(std::optional<plist::Date> a, std::optional<plist::Date> b) {
+  if (!a || !b) return !a && !b;
+  return std::floor(a->secondsSinceEpoch()) == std::floor(b->secondsSinceEpoch());
+}
+
 void readMemory(Device& device) {
   if (const auto run = LastRun::read(device.root, device.files); run && *run) {
     require((*run)->errors.size() <= LastRun::kErrors);
     if ((*run)->write(device.root, device.files)) {
       const auto again = LastRun::read(device.root, device.files);
-      require(again && *again && (*again)->kind == (*run)->kind &&
-              (*again)->errors == (*run)->errors && (*again)->day == (*run)->day);
+      require(again && *again);
+      const LastRun& one = **run;
+      const LastRun& other = **again;
+      require(other.kind == one.kind && other.errors == one.errors && other.day == one.day &&
+              other.isFinished == one.isFinished && other.errorCount == one.errorCount);
+      require(isSameSecond(other.began, one.began) && isSameSecond(other.ended, one.ended) &&
+              isSameSecond(other.lastFinished, one.lastFinished));
+      require(other.process.process == one.process.process &&
+              other.process.started == one.process.started &&
+              other.process.boot == one.process.boot);
     }
   }
   const std::string path = device.root.path(kUploadStateFile);
@@ -127,16 +142,27 @@ void readMemory(Device& device) {
           static_cast<double>(limits::kLongestUploadPauseSeconds));
   if (!writeUploadState(device.files, device.coding, path, state)) return;
   const auto again = readUploadState(device.files, device.coding, device.log, path);
-  require(again.sent == state.sent && again.failure == state.failure);
+  require(again.sent == state.sent && again.failure == state.failure &&
+          again.refused == state.refused && again.failedAttempts == state.failedAttempts &&
+          again.failedTransfers == state.failedTransfers);
+  require(isSameSecond(again.lastAttempt, state.lastAttempt) &&
+          isSameSecond(again.lastSuccess, state.lastSuccess) &&
+          isSameSecond(again.lastFailure, state.lastFailure) &&
+          isSameSecond(again.nextAttempt, state.nextAttempt));
 }
 
 void readNotes(Device& device, std::string_view content) {
   device.write("/run/tavrel/fold.lock", content);
+  bool isNew = false;
+  {
+    auto notes = FoldNotes::lock(device.root, device.files, device.log);
+    require(static_cast<bool>(notes));
+    isNew = notes->logOnce("a line");
+    require(!isNew || !notes->logOnce("a line"));
+    notes->save();
+  }
   auto notes = FoldNotes::lock(device.root, device.files, device.log);
-  require(static_cast<bool>(notes));
-  const bool isNew = notes->logOnce("a line");
-  require(!isNew || !notes->logOnce("a line"));
-  notes->save();
+  require(notes && (!isNew || !notes->logOnce("a line")));
 }
 
 }  // namespace

@@ -116,7 +116,8 @@ void readDrives(fuzz::Tree& tree, std::string_view answer, int days) {
   for (int day = 0; day < days; ++day) {
     require(reader.readAll(1'700'000'000 + day * 86'400));
     const Readings readings = loadReadings(tree.root, files);
-    require(readings.faults.empty());
+    const auto drives = findDrives(Machine(tree.root));
+    require(readings.faults.empty() && drives && readings.readings.size() == drives->size());
     for (const Reading& reading : readings.readings)
       require(!reading.from.empty() || !reading.error.empty());
   }

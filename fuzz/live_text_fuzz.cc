@@ -70,10 +70,9 @@ std::string_view deviceOf(std::string_view path) {
   return path.starts_with(kGroups) ? kGroups : path.substr(0, path.rfind('/'));
 }
 
-// The size in bytes of the largest channel, and the number of channels.
-std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling& sampling) {
-  std::size_t count = 0;
-  std::size_t largest = kElementBytes;
+// The sizes of all channels in bytes.
+std::vector<std::size_t> subscribe(LiveMachine& machine, LiveSampling& sampling) {
+  std::vector<std::size_t> sizes;
   for (const plist::Value& service : machine.services()) {
     const auto driver = service.dictionary().number("EntryID")->int64();
     const auto properties = service.dictionary().dictionary("Properties");
@@ -83,12 +82,11 @@ std::pair<std::size_t, std::size_t> subscribe(LiveMachine& machine, LiveSampling
         const std::size_t bytes =
             sampling.add(static_cast<std::uint64_t>(driver), static_cast<std::uint64_t>(id));
         require(bytes > 0 && bytes % kElementBytes == 0);
-        largest = std::max(largest, bytes);
-        ++count;
+        sizes.push_back(bytes);
       }
     }
   }
-  return {largest, count};
+  return sizes;
 }
 
 }  // namespace
@@ -119,14 +117,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   fuzz::SilentLog log;
   LiveMachine machine(tree.root, log, isPatient ? kPatient : LiveMachine::Options{0, 0});
   const auto sampling = machine.subscribe();
-  const auto [largest, count] = subscribe(machine, *sampling);
-  std::vector<std::byte> room(largest);
+  const std::vector<std::size_t> sizes = subscribe(machine, *sampling);
+  std::vector<std::byte> room(sizes.empty() ? 0 : std::ranges::max(sizes));
   for (const bool isEmptied : {false, true}) {
     if (isEmptied) tree.write(kFiles[last].path, "");
     sampling->update();
-    for (std::size_t i = 0; i < count; ++i) {
+    for (std::size_t i = 0; i < sizes.size(); ++i) {
       const std::size_t written = sampling->write(i, room);
-      require(written <= room.size() && written % kElementBytes == 0);
+      require(written <= sizes[i] && written % kElementBytes == 0);
     }
   }
   for (std::string_view rest = contents[last]; !rest.empty();) {

@@ -99,7 +99,7 @@ void mend(const plist::Dictionary& recording) {
   }
 }
 
-// Everything that a caller can ask of a service, except its properties.
+// Everything that a caller can ask of a service, except its properties, with the answers.
 std::string ask(DriverService& service) {
   std::string said;
   std::uint64_t id = 0;
@@ -121,8 +121,11 @@ std::string ask(DriverService& service) {
       std::size_t length = room.size() + 1;
       const auto code =
           client->callMethod(method, {}, input, std::span(scalar).first(outputs), room, length);
-      require(code != kKernelSuccess || length <= room.size());
       said += ' ' + std::to_string(code);
+      if (code != kKernelSuccess) continue;
+      require(length <= room.size());
+      said += ' ' + std::to_string(scalar[0]) + ' ';
+      said += asText(ByteSpan(room).first(length));
     }
   }
   std::unique_ptr<MappedMemory> memory;
@@ -142,13 +145,14 @@ std::string walk(DriverRegistry& registry, const plist::Dictionary& matching) {
   return said;
 }
 
-void sample(DriverRegistry& registry) {
+// The last samples; null when nothing could be subscribed.
+plist::Dictionary sample(DriverRegistry& registry) {
   Silence streams;
   const plist::Dictionary channels = IOReportCopyAllChannels(registry, streams, 0, nullptr);
   plist::Dictionary subscribed;
   const auto subscription =
       IOReportCreateSubscription(registry, nullptr, channels, &subscribed, 0, nullptr);
-  if (!subscription) return;
+  if (!subscription) return {};
   require(subscription->buffer().size() % kElementBytes == 0);
   plist::Dictionary earlier;
   for (int update = 0; update < 3; ++update) {
@@ -161,6 +165,7 @@ void sample(DriverRegistry& registry) {
     if (earlier) IOReportCreateSamplesDelta(earlier, samples, nullptr);
     earlier = samples;
   }
+  return earlier;
 }
 
 }  // namespace
@@ -180,9 +185,10 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const std::string said = walk(registry, plist::Dictionary::create());
   require(static_cast<std::size_t>(std::ranges::count(said, '\n')) >= recording.services().size());
   walk(registry, {{"IOProviderClass", kReportHubClass}});
-  sample(registry);
+  const plist::Dictionary samples = sample(registry);
 
   RecordedRegistry again(registry.recording(), log);
   require(walk(again, plist::Dictionary::create()) == said);
+  require(plist::Value(sample(again)) == plist::Value(samples));
   return 0;
 }
