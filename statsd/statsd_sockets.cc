@@ -2,6 +2,7 @@
 
 #include <array>
 #include <cerrno>
+#include <csignal>
 #include <fcntl.h>
 #include <memory>
 #include <netinet/in.h>
@@ -69,6 +70,47 @@ bool isAbandoned(const sockaddr_un& address) {
   const auto* const any = reinterpret_cast<const sockaddr*>(&address);
   return probe && connect(probe->descriptor(), any, sizeof address) != 0 && errno == ECONNREFUSED;
 }
+
+// A datagram on a Unix socket may bring descriptors, which the kernel closes when it is received.
+// Closing a TCP socket waits as long as its sender likes (SO_LINGER). Linux 6.16 and later can
+// refuse descriptors; a signal ends the wait on any kernel, and the datagram is received all the
+// same.
+bool mayWaitForClosing(int descriptor) {
+#ifdef SO_PASSRIGHTS
+  constexpr int kPassRights = SO_PASSRIGHTS;
+#else
+  constexpr int kPassRights = 83;
+#endif
+  int domain = 0;
+  socklen_t size = sizeof domain;
+  getsockopt(descriptor, SOL_SOCKET, SO_DOMAIN, &domain, &size);
+  if (domain != AF_UNIX) return false;
+  constexpr int kNo = 0;
+  setsockopt(descriptor, SOL_SOCKET, kPassRights, &kNo, sizeof kNo);
+  return true;
+}
+
+// Interrupts a system call that lasts longer than a second.
+class Alarm {
+ public:
+  explicit Alarm(bool isNeeded) : isSet_(isNeeded) {
+    if (isSet_) alarm(1);
+  }
+  ~Alarm() {
+    if (isSet_) alarm(0);
+  }
+  Alarm(const Alarm&) = delete;
+  Alarm& operator=(const Alarm&) = delete;
+
+  static void prepare() {
+    struct sigaction action {};
+    action.sa_handler = [](int) {};  // SIG_IGN would interrupt nothing
+    sigaction(SIGALRM, &action, nullptr);
+  }
+
+ private:
+  const bool isSet_;
+};
 
 // The buffers that the kernel fills with a batch.
 class Batch {
@@ -170,9 +212,12 @@ Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
                         std::optional<std::chrono::milliseconds> idle,
                         const DatagramHandlers& handlers) {
   std::vector<pollfd> waiting;
-  waiting.reserve(sockets.size());
-  for (const DatagramSocket& socket : sockets)
+  std::vector<bool> needAlarms;
+  for (const DatagramSocket& socket : sockets) {
     waiting.push_back({.fd = socket.descriptor(), .events = POLLIN, .revents = 0});
+    needAlarms.push_back(mayWaitForClosing(socket.descriptor()));
+  }
+  Alarm::prepare();
   Batch batch;
   const int patience = idle ? static_cast<int>(idle->count()) : -1;
   for (;;) {
@@ -180,9 +225,13 @@ Status receiveDatagrams(const std::vector<DatagramSocket>& sockets,
     if (ready == 0) return Done{};
     if (ready < 0 && errno != EINTR) return failure("cannot wait for datagrams");
     if (ready < 0) continue;
-    for (const pollfd& socket : waiting) {
-      if (socket.revents == 0) continue;
-      const int count = batch.receive(socket.fd);
+    for (std::size_t i = 0; i < waiting.size(); ++i) {
+      if (waiting[i].revents == 0) continue;
+      int count = 0;
+      {
+        const Alarm alarm(needAlarms[i]);
+        count = batch.receive(waiting[i].fd);
+      }
       if (count < 0) return failure("cannot receive datagrams");
       batch.hand(count, handlers);
     }

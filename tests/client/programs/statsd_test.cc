@@ -238,6 +238,54 @@ TEST_F(Statsd, EndsWhenItsFileIsRemoved) {
       << "once";
 }
 
+// Without a bound, the reception would take as long as the sender of the descriptor likes.
+TEST(StatsdSockets, DoNotWaitForDescriptorsOfTheirSenders) {
+  const Descriptor server(socket(AF_INET, SOCK_STREAM | SOCK_CLOEXEC, 0));
+  sockaddr_in address{};
+  address.sin_family = AF_INET;
+  address.sin_addr.s_addr = htonl(INADDR_LOOPBACK);
+  socklen_t size = sizeof address;
+  auto* const any = reinterpret_cast<sockaddr*>(&address);
+  ASSERT_TRUE(bind(server.get(), any, size) == 0 && listen(server.get(), 1) == 0 &&
+              getsockname(server.get(), any, &size) == 0);
+  auto passed = std::make_optional<Descriptor>(socket(AF_INET, SOCK_STREAM | SOCK_NONBLOCK, 0));
+  connect(passed->get(), any, size);
+  const Descriptor accepted(accept(server.get(), nullptr, nullptr));
+  const std::string unread(1 << 16, 'x');
+  while (write(passed->get(), unread.data(), unread.size()) > 0) {
+  }
+  const linger forEver{.l_onoff = 1, .l_linger = std::numeric_limits<int>::max()};
+  ASSERT_EQ(setsockopt(passed->get(), SOL_SOCKET, SO_LINGER, &forEver, sizeof forEver), 0);
+
+  int pair[2];
+  ASSERT_EQ(socketpair(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0, pair), 0);
+  const Descriptor sender(pair[0]);
+  std::vector<DatagramSocket> listening;
+  listening.emplace_back(pair[1]);
+  std::string text = "a:1|c";
+  iovec part{.iov_base = text.data(), .iov_len = text.size()};
+  alignas(cmsghdr) std::array<char, CMSG_SPACE(sizeof(int))> control{};
+  msghdr message{};
+  message.msg_iov = &part;
+  message.msg_iovlen = 1;
+  message.msg_control = control.data();
+  message.msg_controllen = control.size();
+  cmsghdr* const header = CMSG_FIRSTHDR(&message);
+  header->cmsg_level = SOL_SOCKET;
+  header->cmsg_type = SCM_RIGHTS;
+  header->cmsg_len = CMSG_LEN(sizeof(int));
+  const int number = passed->get();
+  std::memcpy(CMSG_DATA(header), &number, sizeof number);
+  ASSERT_EQ(sendmsg(sender.get(), &message, 0), 5);
+  passed.reset();
+  std::string received;
+  EXPECT_TRUE(receiveDatagrams(listening, std::chrono::milliseconds(0),
+                               {.take = [&](std::string_view datagram) { received += datagram; },
+                                .dropTooLong = [] {},
+                                .pause = [] { return Status(Done{}); }}));
+  EXPECT_EQ(received, "a:1|c");
+}
+
 TEST(StatsdSockets, SayWhatTheyCannotDo) {
   std::vector<DatagramSocket> others;
   others.emplace_back(open("/dev/null", O_RDONLY | O_CLOEXEC));
