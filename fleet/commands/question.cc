@@ -52,7 +52,8 @@ Question::Question(FleetContext& context, const QuestionOptions& options)
       ledger_(table_, devicesAtLeastOf(options)),
       versions_(shownVersions(ledger_, {})) {
   if (table_.size() == 0) {
-    throw EngineError(context.database() + ": holds no logs: load some with tavrel-fleet load");
+    throw EngineError(databaseName(context.database()) +
+                      ": holds no logs: load some with tavrel-fleet load");
   }
   if (!options.days.empty()) {
     try {

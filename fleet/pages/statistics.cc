@@ -179,20 +179,24 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
   for (const SummaryPart& part : summary.parts) {
     if (part.by == GroupBy::Os) writeGroups(html, "OS versions", part, summary.devicesAtLeast);
     if (part.by == GroupBy::Region) writeGroups(html, "Regions", part, summary.devicesAtLeast);
-    if (part.by != GroupBy::Day) continue;
+    // A century. Other programs may have filed any day.
+    constexpr std::int64_t kMostDays = 36'525;
+    const auto [firstDay, lastDay] =
+        std::pair<std::int64_t, std::int64_t>(summary.whole.firstDay, summary.whole.lastDay);
+    if (part.by != GroupBy::Day || lastDay - firstDay > kMostDays) continue;
     page::LineChart chart;
     chart.name = "Devices by day";
     chart.text = [](double value) { return page::shortNumber(value); };
-    std::int32_t next = summary.whole.firstDay;
+    std::int64_t next = firstDay;
     for (const CountedGroup& group : part.groups) {
       if (!group.name.isValue()) continue;
       for (; next < group.firstDay; ++next)
         chart.values.push_back(std::nullopt);
       chart.values.push_back(static_cast<double>(group.devices));
-      next = group.firstDay + 1;
+      next = std::int64_t{group.firstDay} + 1;
     }
     if (chart.values.size() < 2) continue;
-    for (; next <= summary.whole.lastDay; ++next)
+    for (; next <= lastDay; ++next)
       chart.values.push_back(std::nullopt);
     chart.first = dateText(civilFromDays(summary.whole.firstDay));
     chart.last = dateText(civilFromDays(summary.whole.lastDay));

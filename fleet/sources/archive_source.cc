@@ -63,7 +63,8 @@ class Archive {
     }
     if (code != ARCHIVE_OK && code != ARCHIVE_WARN) return note(), nullptr;
     // Count skipped members as well: they are expanded, too.
-    if (archive_filter_bytes(archive_.get(), 0) > most_ || archive_entry_size(entry) > most_) {
+    const std::int64_t expanded = std::max(archive_filter_bytes(archive_.get(), 0), read_);
+    if (expanded > most_ || archive_entry_size(entry) > most_) {
       failure_ = format("expands to more than %lld times its size", limits::kArchiveRatio);
       return nullptr;
     }
@@ -80,10 +81,11 @@ class Archive {
     while ((code = archive_read_data_block(archive_.get(), &block, &size, &offset)) == ARCHIVE_OK) {
       const auto at = static_cast<std::uint64_t>(offset);
       if (at + size > limit) return false;
-      // Sparse members have holes.
+      // Sparse members have holes, which take no bytes of the archive.
       content.resize(static_cast<std::size_t>(at));
       content.append(static_cast<const char*>(block), size);
     }
+    read_ += std::ssize(content);
     if (code != ARCHIVE_EOF) note();
     return code == ARCHIVE_EOF;
   }
@@ -101,6 +103,7 @@ class Archive {
   };
   std::unique_ptr<archive, Free> archive_;
   std::int64_t most_ = 0;  // how many bytes it may expand to
+  std::int64_t read_ = 0;  // bytes of contents so far
   std::string failure_;
 };
 

@@ -43,6 +43,11 @@ FileType typeOf(mode_t mode) {
                          : FileType::Other;
 }
 
+bool isFolder(const std::string& path) {
+  struct stat status {};
+  return stat(path.c_str(), &status) == 0 && S_ISDIR(status.st_mode);
+}
+
 FileType typeOf(int folder, const dirent& entry) {
   switch (entry.d_type) {
     case DT_REG:
@@ -90,10 +95,13 @@ class Visit {
         subfolder(opened.get(), entry.name, inner, depth);
       } else if (isArchiveName(entry.name)) {
         if (isRegular(entry, inner)) visitArchive(inner, lines_, sink_);
-      } else if (isLogName(entry.name) && isRegular(entry, inner)) {
+      } else if (isLogName(entry.name)) {
+        if (!isRegular(entry, inner)) continue;
         const bool hasSidecar =
             std::ranges::binary_search(entries, sidecarOf(entry.name), {}, &Entry::name);
         log(inner, hasSidecar, false);
+      } else if (entry.type == FileType::Link && isFolder(inner)) {
+        isRegular(entry, inner);
       }
     }
   }

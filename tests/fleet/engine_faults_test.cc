@@ -222,6 +222,8 @@ TEST(EngineFaults, SpeaksTlsWithWhomItMay) {
   const std::string where =
       "clickhouses://127.0.0.1:" + std::to_string(proxy.port) + "/d?retries=0";
   EXPECT_THAT(openingFailure(where), HasSubstr("SSL certificate problem"));
+  EXPECT_THAT(openingFailure(where + "&ca-file=/none"),
+              HasSubstr(": check the address and its ca-file"));
   EXPECT_THAT(openingFailure(where + "&ca-file=" + proxy.folder + "ca.crt"),
               HasSubstr("/d: the server answered with status 400"));
 }
@@ -254,6 +256,13 @@ TEST(EngineFaults, BoundsItsPatience) {
   expect("", "the server refused: A b [0m: check the address and the server's log", 1);
   answerWith("404 Not Found", "");
   expect("", "the server answered with status 404: check the address and the server's log", 1);
+  const std::string other = "does not answer as a ClickHouse server does: check the address";
+  for (const auto& [body, statements] :
+       {std::pair(std::string(), 16), std::pair(std::string("<html>\n"), 1),
+        std::pair(std::string(2U << 20, '1'), 1)}) {
+    answerWith("200 OK", body);
+    expect("", other, statements);
+  }
   answerWith("200 OK", "1");
   answer.replace(answer.find(": 1"), 3, ": 9");
   server.closesAfterAnswer = true;
@@ -274,6 +283,7 @@ TEST(EngineFaults, TakesRowsOnlyWhole) {
   const std::pair<std::string, std::string> cases[] = {
       {"", ""},
       {block + "\2\0\4kind\5UInt8\4name\6String"s + block, "a bc a bc "},
+      {"\2\2\4kind\5UInt8\0\3\4name\6String\1a\2bc"s, "a "},
       {block.substr(0, block.size() - 1), "the answer is incomplete; try again"},
       {"\2\x80\x80\x80\x80\x80\x80\x80\x80\x80\1" + block.substr(2),
        "the answer is incomplete; try again"},

@@ -102,8 +102,11 @@ std::vector<Key> ClickhouseReading::keys() {
   readRows<KeyRow>(
       server_, bytes_, "SELECT DISTINCT kind, name FROM key ORDER BY kind, name",
       [&](std::span<const KeyRow> rows) {
-        for (const KeyRow& row : rows)
+        for (const KeyRow& row : rows) {
+          // Another program may have filed other kinds.
+          if (row.kind > static_cast<std::uint8_t>(KeyKind::Histogram)) continue;
           keys.push_back({std::string(row.name), static_cast<KeyKind>(row.kind)});
+        }
       },
       &KeyRow::kind, &KeyRow::name);
   return keys;

@@ -72,7 +72,13 @@ void makeViews(Server& server, const std::string& database) {
 void checkVersion(const Server& server, std::string versions) {
   if (!versions.empty() && versions.back() == '\n') versions.pop_back();
   if (versions == kVersion) return;
+  constexpr std::size_t kLongest = 100;
   std::replace(versions.begin(), versions.end(), '\n', ',');
+  if (versions.empty() || versions.size() > kLongest ||
+      versions.find_first_not_of("0123456789,") != versions.npos) {
+    throw EngineError(server.address().name +
+                      ": does not answer as a ClickHouse server does: check the address");
+  }
   throw EngineError(server.address().name + ": has tables of version " + versions +
                     ", and this program knows version " + std::string(kVersion) +
                     ": use the program that made them, or load the logs into a new database");
@@ -121,10 +127,10 @@ void openTables(Server& server, bool writes) {
   std::string versions = versionsIn(server, address.database);
   if (versions.empty() && writes) {
     makeTables(server, address.database);
-    versions = kVersion;
-  }
-  if (versions.empty())
+    versions = versionsIn(server, address.database);
+  } else if (versions.empty()) {
     throw EngineError(address.name + ": there are no tables: load logs into it first");
+  }
   checkVersion(server, versions);
   server.use(address.database);
   if (address.cluster.empty()) return;

@@ -18,6 +18,7 @@ constexpr std::chrono::milliseconds kFirstPause{250};
 constexpr std::chrono::milliseconds kLongestPause{30'000};
 constexpr long kConnectSeconds = 10;
 constexpr std::size_t kLongestComplaint = 65'536;
+constexpr std::size_t kLongestText = 1U << 20;  // of an answer that is no rows
 constexpr std::size_t kLongestReason = 300;
 constexpr long kReceiveBytes = 512L << 10;
 // How much of an answer the server buffers in memory; the rest goes to a file there.
@@ -33,6 +34,12 @@ std::string encoded(std::string_view text) {
   std::string result = out;
   curl_free(out);
   return result;
+}
+
+// Whether a failure of libcurl comes from the address or its files and so will not pass.
+bool isLasting(CURLcode code) {
+  return code == CURLE_SSL_CACERT_BADFILE || code == CURLE_PEER_FAILED_VERIFICATION ||
+         code == CURLE_UNSUPPORTED_PROTOCOL || code == CURLE_URL_MALFORMAT;
 }
 
 int codeIn(std::string_view answer) {
@@ -118,10 +125,11 @@ Server::Server(ServerAddress address) : address_(std::move(address)) {}
 std::string Server::urlWith(const std::string& statement) const {
   std::string url = address_.url + "?wait_end_of_query=1&buffer_size=" + kAnswerBytes;
   if (!database_.empty()) url += "&database=" + database_;
-  // The answer comes only once the rows are on all servers of a cluster.
+  if (statement.empty()) return url;
+  // The answer comes only once the rows are on all servers of a cluster. Users who may only read
+  // may not set this.
   if (!address_.cluster.empty()) url += "&insert_distributed_sync=1";
-  if (!statement.empty()) url += "&query=" + encoded(statement);
-  return url;
+  return url + "&query=" + encoded(statement);
 }
 
 void Server::refuse(std::string_view answer, long status) const {
@@ -159,6 +167,7 @@ void Server::perform(const std::string& url, std::string_view body, bool isRepea
   if (code != CURLE_OK) {
     const std::string text = address_.name + ": " + curlFailure(code, words);
     if (transfer.handedOut) throw EngineError(text + ": the answer is incomplete; try again");
+    if (isLasting(code)) throw EngineError(text + ": check the address and its ca-file");
     throw PassingError(text + ": check that the server runs and can be reached, and try again");
   }
   long status = 0;
@@ -168,7 +177,13 @@ void Server::perform(const std::string& url, std::string_view body, bool isRepea
 
 std::string Server::ask(std::string_view statement) {
   std::string answer;
-  ask(statement, [&](std::string_view piece) { answer += piece; });
+  ask(statement, [&](std::string_view piece) {
+    answer += piece;
+    if (answer.size() > kLongestText) {
+      throw EngineError(address_.name +
+                        ": does not answer as a ClickHouse server does: check the address");
+    }
+  });
   return answer;
 }
 

@@ -24,6 +24,10 @@ std::string databaseFault(const std::string& where) {
   return "";
 }
 
+std::string databaseName(const std::string& where) {
+  return isServerAddress(where) ? parseServerAddress(where).name : where;
+}
+
 std::unique_ptr<Engine> openEngine(std::string_view where, OpenMode mode) {
   const bool writes = mode == OpenMode::Write;
   if (isServerAddress(where)) return openClickhouseEngine(where, writes);

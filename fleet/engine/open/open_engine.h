@@ -19,6 +19,9 @@ enum class OpenMode : std::uint8_t {
 /// the text, not the database.
 std::string databaseFault(const std::string& where);
 
+/// The name of a database in messages: the address without its password and options, or the path.
+std::string databaseName(const std::string& where);
+
 /// `where` is the path of an SQLite file, or the address of a database on a ClickHouse server:
 /// clickhouse://[USER[:PASSWORD]@]HOST[:PORT]/DATABASE[?OPTION=VALUE[&…]], or clickhouses:// over
 /// TLS. docs/fleet-tables.md lists the options. Throws EngineError.
