@@ -44,7 +44,8 @@ TEST(DocumentTest, ListsItsSections) {
   document.section("Three");
   const std::string text = document.text();
   for (const char* part :
-       {"<title>A &lt;page&gt;</title>", "<h1><bdi>A &lt;page&gt;</bdi></h1>",
+       {"content=\"default-src 'none'; style-src 'unsafe-inline'\">",
+        "<title>A &lt;page&gt;</title>", "<h1><bdi>A &lt;page&gt;</bdi></h1>",
         "<li><a href=\"#s1\">One &amp; two</a></li><li><a href=\"#s2\">Three</a></li>",
         "<section aria-labelledby=\"s1\"><h2 id=\"s1\">One &amp; two</h2>x</section>"})
     EXPECT_NE(text.find(part), std::string::npos) << part;
@@ -100,6 +101,14 @@ TEST(NumberTest, IsShortAndHasItsUnit) {
       {3, "pages", "3 pages"}};
   for (const auto& [value, unit, text] : kFigures)
     EXPECT_EQ(figureText(value, unit), text);
+  std::string units;
+  for (const char* unit :
+       {"KiB", "nanoseconds", "microseconds", "minutes", "degrees Celsius", "millivolts",
+        "microvolts", "milliamperes", "microamperes", "microwatts", "microjoules"})
+    units += figureText(1500, unit) + "; ";
+  EXPECT_EQ(
+      units,
+      "1.5 MiB; 1.5 µs; 1.5 ms; 25 h; 1500 °C; 1.5 V; 1.5 mV; 1.5 A; 1.5 mA; 1.5 mW; 1.5 mJ; ");
 }
 
 TEST(LineChartTest, HasGapsDotsAndABand) {

@@ -476,6 +476,12 @@ TEST_F(HealthReaderTest, SleepsFailuresAndReplacement) {
   write("/sys/devices/pci/nvme0/serial", "S9");
   ASSERT_TRUE(readAll(4000));
   EXPECT_TRUE(readings()["nvme0"].growth.empty());  // another drive
+  write("/sys/devices/pci/nvme0/serial", "");
+  ASSERT_TRUE(readAll(4100));
+  write("/sys/devices/pci/nvme0/model", "another");
+  put(*answers.smart, 48, {9});
+  ASSERT_TRUE(readAll(4200));
+  EXPECT_TRUE(readings()["nvme0"].growth.empty()) << "its model tells it apart";
 
   answers.smart.reset();
   ASSERT_TRUE(readAll(5000));
@@ -549,6 +555,12 @@ TEST(HealthTest, Verdicts) {
       {kNvme, {{"spare_pct", 9}, {"spare_threshold_pct", 10}}, "worn", kWorn},
       {kNvme, {{"critical_warning", 4}, {"media_errors", 1}}, "failing", kFailing | kErrors},
       {DriveKind::Ata, {{"smart_good", 0}}, "failing", kFailing},
+      {DriveKind::Ata,
+       {{"failing_attributes", 1}, {"bad_sectors", 1}},
+       "failing",
+       kFailing | kErrors},
+      {DriveKind::Emmc, {{"life_a_pct", 100}, {"life_b_pct", 100}}, "good", 0},
+      {kNvme, {{"uncorrectable_reads", 1}}, "errors", kErrors},
       {DriveKind::Emmc, {{"pre_eol", 3}}, "failing", kFailing | kWorn},
       {kNvme, {}, "unknown", kUnread, "no"}};
   for (const auto& each : cases) {

@@ -124,7 +124,9 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
   const std::string good = *plist::writeBinary(plist::Dictionary{{"operation", 0}});
   const auto goodBytes = asBytes(good);
   const Descriptor sealed = memoryFile(goodBytes, kAllSeals);
-  const Descriptor unsealed = memoryFile(goodBytes, F_SEAL_SHRINK | F_SEAL_GROW);
+  const Descriptor writable = memoryFile(goodBytes, F_SEAL_SHRINK | F_SEAL_GROW);
+  const Descriptor growing = memoryFile(goodBytes, F_SEAL_SHRINK | F_SEAL_WRITE);
+  const Descriptor shrinking = memoryFile(goodBytes, F_SEAL_GROW | F_SEAL_WRITE);
   const Descriptor noMessage = memoryFile(asBytes("<plist"), kAllSeals);
   Descriptor huge(memfd_create("huge", MFD_CLOEXEC | MFD_ALLOW_SEALING));
   ASSERT_EQ(ftruncate(huge.get(), (16 << 20) + 1), 0);
@@ -138,7 +140,9 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
       {std::string(70'000, 'x'), {}, "the packet is larger than 65536 bytes"},
       {good, {sealed.get()}, "a packet that passes a memory file must be empty"},
       {"", {sealed.get(), sealed.get(), sealed.get()}, "not exactly one descriptor"},
-      {"", {unsealed.get()}, "not sealed against shrinking, growing and writing"},
+      {"", {writable.get()}, "not sealed against shrinking, growing and writing"},
+      {"", {growing.get()}, "not sealed against shrinking, growing and writing"},
+      {"", {shrinking.get()}, "not sealed against shrinking, growing and writing"},
       {"", {ordinary.get()}, "not a memory file that can be sealed"},
       {"", {huge.get()}, "the memory file has 16777217 bytes, the limit is 16777216"}};
   std::size_t before = 0;
@@ -167,7 +171,7 @@ TEST_F(ServiceTest, DropsPeersThatSendNoMessages) {
   }
   log.lines.clear();
   listener.reset();
-  EXPECT_EQ(log.lines, Lines{"10 more refusals were not logged"});
+  EXPECT_EQ(log.lines, Lines{"12 more refusals were not logged"});
 }
 
 TEST_F(ServiceTest, LosesNothingOfABurstAndLetsPeersBeyondTheLimitWait) {

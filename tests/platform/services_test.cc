@@ -146,14 +146,13 @@ TEST_F(ServicesTest, CrashReportingNamesTheDevice) {
   write("/etc/machine-id", "0123456789abcdef0123456789abcdef\n");
   write("/sys/firmware/devicetree/base/model", std::string("Pellio \tBoard 2\0", 16));
   const std::regex uuid("[0-9A-F]{8}-[0-9A-F]{4}-4[0-9A-F]{3}-[89AB][0-9A-F]{3}-[0-9A-F]{12}");
-  const std::string identifier = reporting.systemIdentifier();
+  EXPECT_EQ(reporting.systemIdentifier(), "E92D9BA2-1CAA-529C-3CD6-BDF6524057A6");
   EXPECT_EQ(reporting.hardwareModel(), "Pellio  Board 2");
   const std::string incident = reporting.incidentIdentifier();
   EXPECT_TRUE(std::regex_match(incident, uuid)) << incident;
   EXPECT_NE(incident, reporting.incidentIdentifier());
   write("/etc/machine-id", "uninitialized\n");
   EXPECT_EQ(reporting.systemIdentifier(), "unknown");
-  EXPECT_NE(identifier, "unknown");
 }
 
 TEST_F(ServicesTest, SystemLogWritesLinesOnAStreamAndCutsLongMessagesAboveDebugLevel) {
@@ -198,8 +197,7 @@ TEST_F(ServicesTest, SystemLogSpeaksToTheJournalWhenTheStreamIsItsOwn) {
   const auto received = [&](int flags = 0) {
     std::string packet(1000, '\0');
     const ssize_t size = recv(journal.get(), packet.data(), packet.size(), flags);
-    packet.resize(static_cast<std::size_t>(std::max<ssize_t>(size, 0)));
-    return packet;
+    return size < 0 ? "nothing" : packet.substr(0, static_cast<std::size_t>(size));
   };
   setenv("JOURNAL_STREAM", name.c_str(), 1);
   LinuxSystemLog systemLog(stream.get(), path);

@@ -131,6 +131,7 @@ TEST_F(Submission, LogsAreWholeWithMetadataAfterEveryFault) {
       }
     }
     EXPECT_TRUE(names.size() == 1 || (!filed && names.empty())) << "what was filed stays";
+    EXPECT_TRUE(faulty.hasStruck() || after.submission.logs(Place::Pending)->empty());
 
     EXPECT_TRUE(after.file());
     after.submission.submitDiagnosticLogs();
@@ -254,19 +255,26 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
   ask();
   EXPECT_EQ(files(), before);
 
-  // Preferences that become unreadable after the first look may hold a permission, too.
-  permit(*this, false);
-  struct Damaging : FileSystem {
-    explicit Damaging(const TemporaryRoot& device) : root(device) {}
+  // Preferences that change after the first look count as they are under the lock.
+  struct Meddling : FileSystem {
     int openFile(const char* path, int flags, mode_t mode) override {
-      if (std::string_view(path).ends_with("Submission/.lock")) root.write(kPermission, "damaged");
+      if (std::string_view(path).ends_with("Submission/.lock")) beforeLock();
       return FileSystem::openFile(path, flags, mode);
     }
-    const TemporaryRoot& root;
-  } damaging(*this);
-  EXPECT_FALSE(Service(root, &damaging).submission.isDiagnosticSubmissionEnabled());
-  EXPECT_EQ(contentOf(root.path(kPermission)), "damaged");
-  EXPECT_EQ(files(), before);
+    std::function<void()> beforeLock;
+  } meddling;
+  const std::function<void()> changes[] = {[&] { write(kPermission, "damaged"); },
+                                           [&] { permit(*this, true); }};
+  for (const auto& change : changes) {
+    permit(*this, false);
+    meddling.beforeLock = change;
+    EXPECT_FALSE(Service(root, &meddling).submission.isDiagnosticSubmissionEnabled());
+    EXPECT_EQ(files(), before);
+  }
+  meddling.beforeLock = [&] { permit(*this, false); };
+  write(kFolder + "pending/c.log", "x");
+  Service(root, &meddling).submission.submitDiagnosticLogs();
+  EXPECT_TRUE(fs::remove(root.path(kFolder + "pending/c.log"))) << "it is no longer permitted";
 
   permit(*this, false, kToday + 1);
   EXPECT_EQ(ask(),

@@ -19,7 +19,7 @@ Words completeInBash(const TemporaryDevice& device, const std::string& line) {
                    "COMP_CWORD=$((${#COMP_WORDS[@]} - 1))\n_tavrelctl\n"
                    "printf '%s\\n' \"${COMPREPLY[@]}\"\n");
   const std::string command =
-      "bash " + device.path("/line.bash") + " > " + device.path("/words") + " 2>&1";
+      "LC_ALL=C bash " + device.path("/line.bash") + " > " + device.path("/words") + " 2>&1";
   EXPECT_EQ(std::system(command.c_str()), 0);
   std::istringstream list(contentOf(device.path("/words")));
   Words words;

@@ -104,11 +104,14 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "cpu.pressure_some=7 io.pressure_some=77 io.pressure_full=5 irq.pressure_full=9 "},
       {{{"/proc/schedstat", "version 15\ntimestamp 1\ncpu1 0 0 0 0 0 0 11 22 33\ndomain0 3 9\n"}},
        "cpu1.sched_run=11 cpu1.sched_wait=22 cpu1.sched_slices=33 "},
-      {{{"/proc/vmstat", "nr_free_pages 9\npswpin 3\npgpgin 2\noom_kill 1\nother x\n"}},
+      {{{"/proc/vmstat",
+         "nr_free_pages 9\npswpin 3\npgpgin 2\noom_kill 1\npgscan_kswapd 5\nother x\n"}},
        "memory.paged_in=2048 memory.swapped_in=" + std::to_string(3 * sysconf(_SC_PAGESIZE)) +
+           " memory.scanned_kswapd=" + std::to_string(5 * sysconf(_SC_PAGESIZE)) +
            " memory.oom_kills=1 "},
-      {{{"/proc/meminfo", "MemTotal:       100 kB\nDirty:     x kB\nSlab: 7 kB\n"}},
-       "memory.total=100 memory.slab=7 "},
+      {{{"/proc/meminfo",
+         "MemTotal:       100 kB\nDirty:     x kB\nSlab: 7 kB\nHardwareCorrupted: 8 kB\n"}},
+       "memory.total=100 memory.slab=7 memory.hardware_corrupted=8 "},
       // The second disk has the columns of older kernels; partitions are not devices.
       {{{"/proc/diskstats",
          " 8 0 sda 1 2 3 4 5 6 7 8 9 10 11 12 13 14 15 16 17\n 8 1 sda1 1 2 3 4 5 6 7 8 9 10 11\n"
@@ -146,10 +149,11 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "cpu.steal=20 cpu.interrupts=44 cpu.switches=55 cpu.forks=66 cpu2.user=10 cpu2.nice=20 "
        "cpu2.system=30 cpu2.idle=40 cpu2.iowait=50 cpu2.irq=60 cpu2.softirq=70 cpu2.steal=80 "
        "cpu2.guest=90 cpu2.guest_nice=100 "},
-      {{{"/sys/block/zram0/", "mm_stat= 1 2 3 4 5 6,bd_stat=7 8 9"}},
+      {{{"/sys/block/zram0/", "mm_stat= 1 2 3 4 5 6,bd_stat=7 8 9,io_stat=10 11 12 13"}},
        "zram0.zram_data=1 zram0.zram_compressed=2 zram0.zram_used=3 zram0.zram_limit=4 "
        "zram0.zram_used_max=5 zram0.zram_same_pages=6 zram0.zram_backed=7 "
-       "zram0.zram_backing_reads=8 zram0.zram_backing_writes=9 "},
+       "zram0.zram_backing_reads=8 zram0.zram_backing_writes=9 zram0.zram_failed_reads=10 "
+       "zram0.zram_failed_writes=11 "},
       // Processor 1 is offline; handlers of interrupts matter, their numbers do not.
       {{{"/proc/interrupts",
          "       CPU0 CPU2\n 3: 1 2 GIC 9 Level     a, PCIe PME\n 4: 10 20 GIC 8 Edge      b c\n"
@@ -221,16 +225,29 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
       {{{kHwmon + "hwmon1/",
          "name=chip,temp10_input=1,temp1x_input=9,in0_input=2,temp1_crit=9,fan1_input=3"}},
        "chip.temp10=1 chip.in0=2 chip.fan1=3 sensors.hottest=1 "},
-      {{{"/sys/class/power_supply/BAT0/", "cycle_count=210,temp=305"}},
-       "BAT0.cycles=210 BAT0.battery_temp=30500 battery.cycles=210 "},
+      {{{"/sys/class/power_supply/BAT0/", "cycle_count=210,energy_full_design=7,temp=305"}},
+       "BAT0.cycles=210 BAT0.energy_design_uwh=7 BAT0.battery_temp=30500 battery.cycles=210 "
+       "battery.energy_design_uwh=7 "},
+      {{{"/sys/class/powercap/p/", "name=p,energy_uj=1,max_energy_range_uj=2"},
+        {"/sys/class/wakeup/wakeup1/",
+         "name=w,active_count=3,event_count=4,wakeup_count=5,expire_count=6,total_time_ms=7,"
+         "max_time_ms=8,prevent_suspend_time_ms=9"}},
+       "p.energy=1 p.energy_range=2 w.wakeup_active=3 w.wakeup_events=4 w.wakeup_aborts=5 "
+       "w.wakeup_expired=6 w.wakeup_total=7 w.wakeup_longest=8 w.wakeup_prevented=9 "},
       {{{"/sys/devices/system/edac/mc/",
          "mc0/ce_count=4,mc0/dimm1/dimm_ce_count=3,mc0/rank4/dimm_ue_count=6,"
          "mc0/csrow0/ce_count=9,mc1/ce_count=5,mc2/ce_count=unknown"}},
        "mc0.corrected=4 mc0.dimm1.corrected=3 mc0.rank4.uncorrected=6 mc1.corrected=5 "
        "memory.corrected_errors=9 "},
-      {{{"/sys/power/suspend_stats/", "success=4,fail=1"}}, "suspend.success=4 suspend.failed=1 "},
-      {{{"/sys/fs/ext4/sda1/errors_count", "2\n"}, {"/sys/fs/ext4/features/x", "supported\n"}},
-       "sda1.fs_errors=2 fs.errors=2 "},
+      {{{"/sys/power/suspend_stats/", "success=4,fail=1,failed_suspend_noirq=2,max_hw_sleep=3"}},
+       "suspend.success=4 suspend.failed=1 suspend.failed_suspend_noirq=2 "
+       "suspend.longest_hw_sleep=3 "},
+      {{{"/sys/fs/ext4/sda1/", "errors_count=2,lifetime_write_kbytes=3,session_write_kbytes=4"},
+        {"/sys/fs/ext4/features/x", "supported\n"},
+        {"/sys/fs/f2fs/sda2/", "lifetime_write_kbytes=5,free_segments=6,gc_background_calls=7"}},
+       "sda1.fs_errors=2 sda1.fs_lifetime_written=3 sda1.fs_session_written=4 fs.errors=2 "
+       "fs.lifetime_written=3 sda2.fs_lifetime_written=5 sda2.fs_free_segments=6 "
+       "sda2.fs_gc_background=7 f2fs.lifetime_written=5 "},
       {{{"/sys/fs/pstore/dmesg-ramoops-0", ""}, {"/sys/class/watchdog/watchdog0/bootstatus", "32"}},
        "boot.crash_records=1 watchdog0.bootstatus=32 boot.watchdog_status=32 "},
       {{{"/sys/fs/cgroup/unified/b.slice/cgroup.events", "populated 1\n"},
@@ -238,7 +255,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
        "b.slice.cpu=10 "},
       {{{"/sys/fs/cgroup/cgroup.controllers", "cpu"},
         {"/sys/fs/cgroup/a.slice/cgroup.events", "populated 1\n"},
-        {"/sys/fs/cgroup/a.slice/cpu.stat", "usage_usec 10\nnr_throttled 2\n"},
+        {"/sys/fs/cgroup/a.slice/cpu.stat", "usage_usec 10\nnr_throttled 2\nthrottled_usec 3\n"},
         {"/sys/fs/cgroup/a.slice/memory.events", "low 0\noom_kill 1\n"},
         {"/sys/fs/cgroup/a.slice/", "memory.current=4096,memory.peak=max"},
         // The mapping passes its figures on to the disks; two devices have had no I/O.
@@ -246,7 +263,7 @@ TEST(LiveTest, ReadsTheFormsOfTheKernel) {
          "254:0 \n254:1 rbytes=5 wbytes=5 rios=5 wios=5\n7:1 8:0 rbytes=1 wbytes=2 rios=3 wios=4 "
          "dbytes=0 dios=0\n8:16 cost.usage=9 rbytes=10 wbytes=20 rios=30 wios=40\n"},
         {"/sys/block/", "sda/dev=8:0,sda/device/x=-,sdb/dev=8:16,sdb/device/x=-,dm-1/dev=254:1"}},
-       "a.slice.cpu=10 a.slice.cpu_throttles=2 a.slice.memory_oom_kills=1 "
+       "a.slice.cpu=10 a.slice.cpu_throttled=3 a.slice.cpu_throttles=2 a.slice.memory_oom_kills=1 "
        "a.slice.io_reads=33 a.slice.io_writes=44 a.slice.io_read_bytes=11 "
        "a.slice.io_written_bytes=22 a.slice.memory=4096 "},
   };
