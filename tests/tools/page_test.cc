@@ -106,13 +106,15 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
 TEST_F(PageTest, EstimatesHowLongDrivesLast) {
   // The last four had a predecessor of the same name.
   const std::tuple<const char*, int, int> wear[] = {
-      {"nvme3", 11, 40}, {"nvme3", 1, 50},  {"nvme4", 11, 10}, {"nvme4", 10, 59},
-      {"nvme4", 1, 60},  {"nvme5", 11, 20}, {"nvme5", 10, 2},  {"nvme5", 1, 24},
-      {"nvme6", 11, 40}, {"nvme6", 1, 50},  {"nvme7", 11, 40}};
+      {"mmcblk1.life_a_pct", 11, 10}, {"mmcblk1.life_a_pct", 1, 30}, {"mmcblk2.life_b_pct", 11, 10},
+      {"mmcblk2.life_b_pct", 1, 40},  {"nvme8.used_pct", 11, 89},    {"nvme8.used_pct", 1, 99},
+      {"nvme3.used_pct", 11, 40},     {"nvme3.used_pct", 1, 50},     {"nvme4.used_pct", 11, 10},
+      {"nvme4.used_pct", 10, 59},     {"nvme4.used_pct", 1, 60},     {"nvme5.used_pct", 11, 20},
+      {"nvme5.used_pct", 10, 2},      {"nvme5.used_pct", 1, 24},     {"nvme6.used_pct", 11, 40},
+      {"nvme6.used_pct", 1, 50},      {"nvme7.used_pct", 11, 40}};
   std::string rows;
-  for (const auto& [drive, ago, percent] : wear)
-    rows +=
-        format("scalar\t%d\tcom.norvane.ioreport.%s.used_pct\t%d\n", today() - ago, drive, percent);
+  for (const auto& [figure, ago, percent] : wear)
+    rows += format("scalar\t%d\tcom.norvane.ioreport.%s\t%d\n", today() - ago, figure, percent);
   import(rows);
   device.writeDrive("nvme0", "nvme", R"("used_pct": 10, "power_on_hours": 2400)");
   device.writeDrive("nvme1", "nvme", R"("used_pct": 100)");
@@ -123,16 +125,27 @@ TEST_F(PageTest, EstimatesHowLongDrivesLast) {
   device.writeDrive("nvme6", "nvme", R"("used_pct": 3, "power_on_hours": 720)");
   device.writeDrive("nvme7", "nvme", R"("used_pct": 3)");
   device.writeDrive("mmcblk0", "emmc", R"("life_a_pct": 10, "life_b_pct": 20)");
+  device.writeDrive("mmcblk1", "emmc", R"("life_a_pct": 30)");
+  device.writeDrive("mmcblk2", "emmc", R"("life_b_pct": 40)");
+  device.writeDrive("mmcblk3", "emmc", R"("life_a_pct": 100)");
+  device.writeDrive("mmcblk4", "emmc", R"("life_a_pct": 110)");
+  device.writeDrive("nvme8", "nvme", R"("used_pct": 99)");
   device.writeDrive("sda", "ata", R"("smart_good": 0)");
-  expectIn(textOf(), {"About 2.5 years of operation at the pace of its life so far",
-                      "Its rated life is used up", "Not known yet: no wear so far",
-                      "About 50 days at the pace of the days on this page",
-                      "About 64 days of operation at the pace of its life so far",
-                      "About 31 days at the pace of the days on this page",
-                      "About 2.7 years of operation at the pace of its life so far",
-                      "Not known yet: it has replaced another drive on these days",
-                      "Not known yet: its wear has not changed on these days",
-                      "Not known: the drive reports no wear", "failing, SMART status is failing"});
+  expectIn(textOf(),
+           {"About 2.5 years of operation at the pace of its life so far",
+            "Its rated life is used up used 100.0 % left 0.0 % Figure Value Meaning nvme1",
+            "Its rated life is used up used 100.0 % left 0.0 % Figure Value Meaning mmcblk4",
+            "At most a tenth of its rated life used at most 100.0 % left at least 0.0 %",
+            "Not known yet: its wear has grown by fewer than three steps on these days",
+            "About 20 days at the pace of the days on this page used at most 40.0 %",
+            "About 1 day at the pace", "Not known yet: no wear so far",
+            "About 50 days at the pace of the days on this page",
+            "About 64 days of operation at the pace of its life so far",
+            "About 31 days at the pace of the days on this page",
+            "About 2.7 years of operation at the pace of its life so far",
+            "Not known yet: it has replaced another drive on these days",
+            "Not known yet: its wear has not changed on these days",
+            "Not known: the drive reports no wear", "failing, SMART status is failing"});
 }
 
 TEST_F(PageTest, RefusesWhatItCannotDo) {

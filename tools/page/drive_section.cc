@@ -10,6 +10,7 @@
 #include "page/charts.h"
 #include "page/number_text.h"
 #include "page/table.h"
+#include "tools/console/table.h"
 #include "tools/disks/disk_list.h"
 #include "tools/page/sections.h"
 
@@ -23,6 +24,11 @@ constexpr SectionLimit kDriveLimit{32, 150'000};
 std::optional<std::int64_t> figureOf(const Disk& disk, std::string_view name) {
   const std::int64_t* const value = valueOf(disk.reading.figures, name);
   return value ? std::optional(*value) : std::nullopt;
+}
+
+// In percentage points. Figures of eMMC and UFS are the upper ends of steps.
+double stepOf(const Wear& wear) {
+  return wear.figure == "used_pct" ? 1 : 10;
 }
 
 /// Days until the drive is worn out if wear continues at the same pace.
@@ -47,14 +53,13 @@ Trend trendOf(const PageScene& scene, const Disk& disk, const Wear& wear) {
       format("com.norvane.ioreport.%s.%s", disk.reading.name, wear.figure));
   if (known == scene.recorded.scalars.end() || known->second.days.empty()) return trend;
   constexpr double kMostPerDay = 5;
-  const double step = wear.figure == "used_pct" ? 1 : 10;
   double lastDay = known->second.days.front().first;
   auto lastPercent = static_cast<double>(known->second.days.front().second);
   const auto follow = [&](double day, std::int64_t value, bool isRecorded) {
     const auto percent = static_cast<double>(value);
     const double grown = percent - std::exchange(lastPercent, percent);
     const double inDays = day - std::exchange(lastDay, day);
-    if (grown < 0 || grown > std::max(step, kMostPerDay * inDays)) {
+    if (grown < 0 || grown > std::max(stepOf(wear), kMostPerDay * inDays)) {
       trend = {0, 0, true};
     } else if (isRecorded) {
       trend.growth += grown;
@@ -69,7 +74,7 @@ Trend trendOf(const PageScene& scene, const Disk& disk, const Wear& wear) {
 
 std::string yearsText(double days) {
   constexpr double kYear = 365.25;
-  if (days < 2 * kYear) return format("%s days", page::shortNumber(std::round(days)));
+  if (days < 2 * kYear) return counted(static_cast<std::uint64_t>(std::llround(days)), "day");
   if (days >= 100 * kYear) return "more than 100 years";
   const double years = days / kYear;
   return format("%.*f years", years < 10 ? 1 : 0, years);
@@ -78,6 +83,9 @@ std::string yearsText(double days) {
 std::string lifetimeText(const PageScene& scene, const Disk& disk) {
   const auto wear = wearOf(disk);
   if (!wear) return "Not known: the drive reports no wear";
+  const double step = stepOf(*wear);
+  const bool isStep = step > 1;
+  if (wear->percent == 100 && isStep) return "At most a tenth of its rated life";
   if (wear->percent >= 100) return "Its rated life is used up";
   const Trend trend = trendOf(scene, disk, *wear);
   const auto byTrend = [&](double leastGrowth) -> std::optional<std::string> {
@@ -86,18 +94,20 @@ std::string lifetimeText(const PageScene& scene, const Disk& disk) {
     if (!days) return std::nullopt;
     return format("About %s at the pace of the days on this page", yearsText(*days));
   };
-  // The recent pace is a better guide than that of the whole life, unless it is only a step
-  // or two of a whole percent.
-  constexpr double kClearGrowth = 3;
-  if (const auto text = byTrend(kClearGrowth)) return *text;
+  // The recent pace is a better guide than that of the whole life, unless it is only a step or two.
+  constexpr double kClearSteps = 3;
+  if (const auto text = byTrend(kClearSteps * step)) return *text;
   constexpr double kHoursPerDay = 24;
-  if (const auto hours = figureOf(disk, "power_on_hours"); hours && wear->figure == "used_pct") {
+  if (const auto hours = figureOf(disk, "power_on_hours"); hours && !isStep) {
     const double days = static_cast<double>(*hours) / kHoursPerDay;
     const auto percent = static_cast<double>(wear->percent);
     if (const auto left = daysLeft(percent, days, percent))
       return format("About %s of operation at the pace of its life so far", yearsText(*left));
   }
-  if (const auto text = byTrend(1)) return *text;
+  if (isStep && trend.growth > 0) {
+    return "Not known yet: its wear has grown by fewer than three steps on these days";
+  }
+  if (const auto text = byTrend(step)) return *text;
   if (wear->percent == 0) return "Not known yet: no wear so far";
   return trend.isReplacement ? "Not known yet: it has replaced another drive on these days"
                              : "Not known yet: its wear has not changed on these days";
@@ -133,7 +143,9 @@ void writeDrive(const PageScene& scene, page::HtmlWriter& html, const Disk& disk
   html.end();
   if (const auto wear = wearOf(disk)) {
     const double used = std::clamp(static_cast<double>(wear->percent) / 100, 0.0, 1.0);
-    const page::Share shares[] = {{"used", used, {}}, {"left", 1 - used, {}}};
+    const bool isBound = stepOf(*wear) > 1 && wear->percent <= 100;
+    const page::Share shares[] = {{isBound ? "used at most" : "used", used, {}},
+                                  {isBound ? "left at least" : "left", 1 - used, {}}};
     page::writeShares(html, format("Wear of %s", reading.name), shares);
   }
   const std::vector<NamedFigure> figures = figuresOf({reading});
