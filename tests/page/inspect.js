@@ -28,6 +28,14 @@
     }
   }
 
+  // Texts without a title begin at the left.
+  for (const cell of document.querySelectorAll('td:not([data-title])')) {
+    const range = document.createRange();
+    range.selectNodeContents(cell);
+    if (range.getBoundingClientRect().left > cell.getBoundingClientRect().left + near)
+      faults.push(`at the right: ${cell.textContent.slice(0, 60)}`);
+  }
+
   const luminance = color => {
     const [red, green, blue] = color.match(/[\d.]+/g).map(part => {
       const share = part / 255;
