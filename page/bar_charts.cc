@@ -59,8 +59,8 @@ void writeHistogram(HtmlWriter& html, const Histogram& histogram) {
     total += cell.count;
   }
   std::string name = histogram.name + ": ";
-  name += total > 0 ? format("%s values, most in %s: %s", shortNumber(total), most.label,
-                             shortNumber(most.count))
+  name += total > 0 ? format("%s %s, most in %s: %s", shortNumber(total),
+                             total == 1 ? "value" : "values", most.label, shortNumber(most.count))
                     : "no values";
   html.begin("div", {{"class", "histogram"}});
   html.element("span", shortNumber(most.count), {{"class", "top"}});

@@ -71,6 +71,12 @@ std::string timeText(double seconds) {
   return format("%s %s", shortNumber(value), isHours ? "h" : "days");
 }
 
+std::string withUnit(const std::string& number, std::string_view unit) {
+  if (std::ranges::find(kPlainUnits, unit) != std::end(kPlainUnits)) return number;
+  if (unit == "percent") return number + kBlank + "%";
+  return number + " " + std::string(unit);
+}
+
 }  // namespace
 
 std::string shortNumber(double value) {
@@ -91,15 +97,23 @@ std::string exactNumber(double value) {
 }
 
 std::string figureText(double value, std::string_view unit) {
-  if (std::ranges::find(kPlainUnits, unit) != std::end(kPlainUnits)) return shortNumber(value);
-  if (unit == "percent") return shortNumber(value) + kBlank + "%";
   for (const ScaledUnit& scaled : kScaledUnits) {
     if (scaled.name != unit) continue;
     if (scaled.base == kSize) return sizeText(value * scaled.factor);
     if (scaled.base == kTime) return timeText(value * scaled.factor);
     return quantityText(value * scaled.factor, scaled.base);
   }
-  return shortNumber(value) + " " + std::string(unit);
+  return withUnit(shortNumber(value), unit);
+}
+
+std::string figureText(std::int64_t value, std::string_view unit) {
+  if (std::ranges::find(kScaledUnits, unit, &ScaledUnit::name) != std::end(kScaledUnits))
+    return figureText(static_cast<double>(value), unit);
+  return withUnit(shortNumber(value), unit);
+}
+
+std::string exactFigure(double value, std::string_view unit) {
+  return withUnit(exactNumber(value), unit);
 }
 
 }  // namespace tavrel::page

@@ -19,5 +19,9 @@ std::string exactNumber(double value);
 /// "1.5 GiB", "12.5 ms", "3.2 days", "41.3 °C". Percentages are "12 %", counts have no unit, and
 /// any other unit follows the number.
 std::string figureText(double value, std::string_view unit);
+std::string figureText(std::int64_t value, std::string_view unit);
+
+/// All digits of a number, with its unit unchanged: "204 900 MiB".
+std::string exactFigure(double value, std::string_view unit);
 
 }  // namespace tavrel::page

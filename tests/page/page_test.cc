@@ -105,10 +105,14 @@ TEST(NumberTest, IsShortAndHasItsUnit) {
   for (const char* unit :
        {"KiB", "nanoseconds", "microseconds", "minutes", "degrees Celsius", "millivolts",
         "microvolts", "milliamperes", "microamperes", "microwatts", "microjoules"})
-    units += figureText(1500, unit) + "; ";
+    units += figureText(1500.0, unit) + "; ";
   EXPECT_EQ(
       units,
       "1.5 MiB; 1.5 µs; 1.5 ms; 25 h; 1500 °C; 1.5 V; 1.5 mV; 1.5 A; 1.5 mA; 1.5 mW; 1.5 mJ; ");
+  constexpr std::int64_t kPages = (std::int64_t{1} << 53) + 1;
+  EXPECT_EQ(figureText(kPages, "pages"), "9\u202F007\u202F199\u202F254\u202F740\u202F993 pages");
+  EXPECT_EQ(figureText(std::int64_t{2048}, "MiB"), "2.0 GiB");
+  EXPECT_EQ(exactFigure(204900.5, "MiB"), "204\u202F900.5 MiB");
 }
 
 TEST(LineChartTest, HasGapsDotsAndABand) {
@@ -140,9 +144,12 @@ TEST(LineChartTest, HasGapsDotsAndABand) {
 TEST(BarChartsTest, ShowWhatIsNotNothing) {
   HtmlWriter histogram;
   writeHistogram(histogram, {"H", {{"(0, 1]", 1}, {"(1, 2]", 0}, {"(2, 3]", 1e6}}, "0", "3"});
-  EXPECT_EQ(attributes(histogram, "x") + attributes(histogram, "height"), "0\n40\n4\n1000\n");
+  writeHistogram(histogram, {"I", {{"(0, 1]", 1}}, "0", "1"});
+  EXPECT_EQ(attributes(histogram, "x") + attributes(histogram, "height"),
+            "0\n40\n0\n4\n1000\n1000\n");
   EXPECT_EQ(attributes(histogram, "aria-label"),
-            "H: 1\u202F000\u202F001 values, most in (2, 3]: 1\u202F000\u202F000\n");
+            "H: 1\u202F000\u202F001 values, most in (2, 3]: 1\u202F000\u202F000\n"
+            "I: 1 value, most in (0, 1]: 1\n");
   HtmlWriter bars;
   const Bar kBars[] = {{"a.b", 0.5, "5"}, {"b", -1, "-1"}, {"c", kNan, "?"}, {"d", 0.25, ""}};
   writeBars(bars, "B", kBars);

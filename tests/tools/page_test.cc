@@ -59,20 +59,24 @@ TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
 }
 
 TEST_F(PageTest, TellsWhatLeaves) {
+  const std::string near = "1\u202F000\u202F000\u202F000";
   import(
       "scalar\tyesterday\tcom.example.s\t1234\nscalar\tyesterday\tcom.example.t\t5\n"
+      "value\tyesterday\tcom.example.e\t1\t1000000000.2\n"
+      "value\tyesterday\tcom.example.e\t2\t1000000000.4\n"
       "value\tyesterday\tcom.example.d\t1\t3\nvalue\tyesterday\tcom.example.d\t2\tinf\n"
       "value\tyesterday\tcom.example.d\t3\tnan\n");
   expectIn(textOf(), {"2 scalars. None leaves the device, because there is no log of this day: "});
   device.write(kWhitelistFile, xmlOf(R"({"Usage": {
       "ScalarKeys": {"com.example.s": {"sig_fig": 1}},
       "DistributionKeys": {"com.example.d": {"intervals": [2, 4]}}}})"));
-  expectIn(textOf(),
-           {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
-            "has not allowed it",
-            "com.example.s 1234 1000 com.example.t 5 not in it",
-            "Values 3 Range 3 to inf Median 3 Mean inf",
-            "and how many values are in (2, 4] 1 (4, inf) 2"});
+  expectIn(
+      textOf(),
+      {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
+       "has not allowed it",
+       "com.example.s 1234 1000 com.example.t 5 not in it",
+       "Values 3 Range 3 to inf Median 3 Mean inf Not a number 1",
+       "Range " + near + ".2 to " + near + ".4", "and how many values are in (2, 4] 1 (4, inf) 2"});
   ASSERT_EQ(device.run("allow --from yesterday").status, 0);
   expectIn(textOf(), {"The owner lets that log leave the device",
                       "Logs may leave the device From " + dayDateText(today() - 1) + " on"});

@@ -101,8 +101,12 @@ void writeLogState(const PageScene& scene, page::HtmlWriter& html, std::uint64_t
 }
 
 std::string rangeText(const Summary& summary, std::string_view unit) {
-  return format("%s to %s", figureText(summary.minimum(), unit),
-                figureText(summary.maximum(), unit));
+  const std::string low = figureText(summary.minimum(), unit);
+  const std::string high = figureText(summary.maximum(), unit);
+  if (low != high || summary.minimum() == summary.maximum()) return format("%s to %s", low, high);
+  // Ends that rounding makes alike are written in full.
+  return format("%s to %s", page::exactFigure(summary.minimum(), unit),
+                page::exactFigure(summary.maximum(), unit));
 }
 
 // The two ends of a label such as "(10, 20]".
@@ -183,6 +187,7 @@ void writeDistribution(page::HtmlWriter& html, std::string_view key, const Summa
     if (values.median) figure("Median", figureText(*values.median, unit));
     figure("Mean", figureText(summary.mean(), unit));
   }
+  if (summary.notNumbers() > 0) figure("Not a number", shortNumber(summary.notNumbers()));
   html.end();
   writeDayHistogram(html, key, values);
   writeLogHistogram(html, leaving);
