@@ -14,19 +14,20 @@
 
 namespace tavrel::page {
 
-/// How a chart writes its values; page/number_text.h has the usual ones.
-using NumberText = std::function<std::string(double value)>;
-
 /// Values over days. The line has gaps where data is missing; a value between gaps is a dot.
 struct LineChart {
-  std::string name;                           // accessible
-  std::vector<std::optional<double>> values;  // one per day
+  std::string name;  // accessible
+  /// One per day. Only their differences matter, so that they may count from any value.
+  std::vector<std::optional<double>> values;
   /// A band around the line, such as the extremes of each day: for the same days, or empty.
   std::vector<std::optional<double>> lows = {};
   std::vector<std::optional<double>> highs = {};
   std::string first;  // labels of the first and the last day
   std::string last;
-  NumberText text;
+  /// Labels of the extremes, including those of the band. When both are the same, the line is flat.
+  std::string lowest;
+  std::string highest;
+  std::string latest;  // the text of the last value
 };
 void writeLineChart(HtmlWriter& html, const LineChart& chart);
 
@@ -70,7 +71,8 @@ struct IntervalChart {
   };
   std::vector<Row> rows;
   double reference = 0;
-  NumberText text;  // for the scale
+  /// Writes the numbers of the scale; page/number_text.h has the usual ways.
+  std::function<std::string(double value)> text;
 };
 void writeIntervals(HtmlWriter& html, const IntervalChart& chart);
 

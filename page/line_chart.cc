@@ -56,26 +56,33 @@ void appendSteps(std::string& path, const Values& values, std::size_t begin, std
   }
 }
 
-std::string linePath(const Values& values, const Range& range) {
-  std::string path;
+// Single days need a wider stroke: their lines have no length, and their areas no width.
+struct Paths {
+  std::string runs, singleDays;
+};
+
+Paths linePaths(const Values& values, const Range& range) {
+  Paths paths;
   for (std::size_t day = 0; day < values.size(); ++day) {
     const std::size_t end = endOfRun(values, day);
     if (end == day) continue;
-    appendFormat(path, "M%zu %d", day, heightOf(*values[day], range));
-    // A line of length 0 shows as a dot.
-    if (end == day + 1) path += "h0";
+    const bool isSingle = end == day + 1;
+    std::string& path = isSingle ? paths.singleDays : paths.runs;
+    appendFormat(path, "M%zu %d%s", day, heightOf(*values[day], range), isSingle ? "h0" : "");
     appendSteps(path, values, day, end, range);
     day = end;
   }
-  return path;
+  return paths;
 }
 
 // Areas that run along the lows and back along the highs.
-std::string bandPath(const LineChart& chart, const Range& range) {
-  std::string path;
+Paths bandPaths(const LineChart& chart, const Range& range) {
+  Paths paths;
   for (std::size_t day = 0; day < chart.lows.size(); ++day) {
     const std::size_t end = std::min(endOfRun(chart.lows, day), endOfRun(chart.highs, day));
-    if (end <= day + 1) continue;
+    if (end <= day) continue;
+    const bool isSingle = end == day + 1;
+    std::string& path = isSingle ? paths.singleDays : paths.runs;
     appendFormat(path, "M%zu %d", day, heightOf(*chart.lows[day], range));
     appendSteps(path, chart.lows, day, end, range);
     int before = heightOf(*chart.highs[end - 1], range);
@@ -85,40 +92,44 @@ std::string bandPath(const LineChart& chart, const Range& range) {
       appendFormat(path, "%s-1 %d", back + 2 == end ? "l" : " ", height - before);
       before = height;
     }
-    path += 'Z';
+    if (!isSingle) path += 'Z';
     day = end;
   }
-  return path;
+  return paths;
 }
 
-std::string nameOf(const LineChart& chart, const Range& line) {
-  if (line.known == 0) return chart.name + ": no data";
-  std::string name = format("%s: %s to %s, data for %zu of %zu days, lowest %s, highest %s",
-                            chart.name, chart.first, chart.last, line.known, chart.values.size(),
-                            chart.text(line.low), chart.text(line.high));
-  for (auto value = chart.values.rbegin(); value != chart.values.rend(); ++value) {
-    if (!*value || !std::isfinite(**value)) continue;
-    return name + ", last " + chart.text(**value);
-  }
-  return name;
+void writePath(HtmlWriter& html, std::string_view style, const std::string& path) {
+  if (!path.empty()) html.empty("path", {{"class", style}, {"d", path}});
+}
+
+std::string nameOf(const LineChart& chart, std::size_t known) {
+  if (known == 0) return chart.name + ": no finite data";
+  return format("%s: %s to %s, data for %zu of %zu days, lowest %s, highest %s, last %s",
+                chart.name, chart.first, chart.last, known, chart.values.size(), chart.lowest,
+                chart.highest, chart.latest);
 }
 
 }  // namespace
 
 void writeLineChart(HtmlWriter& html, const LineChart& chart) {
-  Range line;
-  line.take(chart.values);
-  Range range = line;
+  Range range;
+  range.take(chart.values);
+  const std::size_t known = range.known;
   range.take(chart.lows);
   range.take(chart.highs);
+  const bool isFlat = chart.lowest == chart.highest;
+  if (isFlat) range.high = range.low;
   const std::size_t width = std::max<std::size_t>(chart.values.size(), 2) - 1;
   html.begin("div", {{"class", "line"}});
-  html.element("span", range.known == 0 ? "none" : chart.text(range.high), {{"class", "top"}});
-  if (range.low != range.high) html.element("span", chart.text(range.low), {{"class", "bottom"}});
-  beginDrawing(html, nameOf(chart, line), width, kHeight);
-  if (const std::string band = bandPath(chart, range); !band.empty())
-    html.empty("path", {{"class", "band"}, {"d", band}});
-  html.empty("path", {{"d", linePath(chart.values, range)}});
+  html.element("span", known == 0 ? "none" : chart.highest, {{"class", "top"}});
+  if (!isFlat) html.element("span", chart.lowest, {{"class", "bottom"}});
+  beginDrawing(html, nameOf(chart, known), width, kHeight);
+  const Paths band = bandPaths(chart, range);
+  writePath(html, "band", band.runs);
+  writePath(html, "bar", band.singleDays);
+  const Paths line = linePaths(chart.values, range);
+  writePath(html, "", line.runs);
+  writePath(html, "dot", line.singleDays);
   html.end();
   html.element("span", chart.first, {{"class", "first"}});
   html.element("span", chart.last, {{"class", "last"}});

@@ -1,4 +1,5 @@
 // The parts of the fleet, and its statistics by version.
+#include <algorithm>
 #include <cmath>
 #include <span>
 
@@ -186,12 +187,13 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
     if (part.by != GroupBy::Day || lastDay - firstDay > kMostDays) continue;
     page::LineChart chart;
     chart.name = "Devices by day";
-    chart.text = [](double value) { return page::shortNumber(value); };
+    std::vector<std::size_t> counts;
     std::int64_t next = firstDay;
     for (const CountedGroup& group : part.groups) {
       if (!group.name.isValue()) continue;
       for (; next < group.firstDay; ++next)
         chart.values.push_back(std::nullopt);
+      counts.push_back(group.devices);
       chart.values.push_back(static_cast<double>(group.devices));
       next = std::int64_t{group.firstDay} + 1;
     }
@@ -200,6 +202,10 @@ void writeFleet(page::HtmlWriter& html, const SummaryAnswer& summary) {
       chart.values.push_back(std::nullopt);
     chart.first = dateText(civilFromDays(summary.whole.firstDay));
     chart.last = dateText(civilFromDays(summary.whole.lastDay));
+    const auto [lowest, highest] = std::ranges::minmax(counts);
+    chart.lowest = countText(lowest);
+    chart.highest = countText(highest);
+    chart.latest = countText(counts.back());
     html.element("h3", "Devices that reported, by day");
     writeLineChart(html, chart);
     if (part.joined == 0) continue;

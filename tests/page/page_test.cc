@@ -116,26 +116,30 @@ TEST(NumberTest, IsShortAndHasItsUnit) {
 }
 
 TEST(LineChartTest, HasGapsDotsAndABand) {
-  LineChart chart{"K", {0, 10, {}, 5, kNan, 10, 7.5, 5}, {}, {}, "first", "last", [](double value) {
-                    return shortNumber(value);
-                  }};
+  LineChart chart{"K", {0, 10, {}, 5, kNan, 10, 7.5, 5}, {}, {}, "first", "last", "0", "10", "x"};
   HtmlWriter line;
   writeLineChart(line, chart);
-  EXPECT_EQ(attributes(line, "d"), "M0 100l1 -100M3 50h0M5 0l1 25 1 25\n");
+  EXPECT_EQ(attributes(line, "d"), "M0 100l1 -100M5 0l1 25 1 25\nM3 50h0\n");
   EXPECT_EQ(attributes(line, "viewBox"), "0 0 7 100\n");
   EXPECT_EQ(attributes(line, "aria-label"),
-            "K: first to last, data for 6 of 8 days, lowest 0, highest 10, last 5\n");
+            "K: first to last, data for 6 of 8 days, lowest 0, highest 10, last x\n");
   chart.values = {5, 5, {}, 5};
   chart.lows = {0, 2.5, {}, 0};
   chart.highs = {10, 7.5, {}, 10};
   HtmlWriter band;
   writeLineChart(band, chart);
-  EXPECT_EQ(attributes(band, "d"), "M0 100l1 -25V25l-1 -25Z\nM0 50l1 0M3 50h0\n");
-  chart = {"K", {{}, {}}, {}, {}, "a", "b", chart.text};
+  EXPECT_EQ(attributes(band, "d"), "M0 100l1 -25V25l-1 -25Z\nM3 100V0\nM0 50l1 0\nM3 50h0\n");
+  EXPECT_EQ(attributes(band, "class"), "line\ntop\nbottom\nband\nbar\ndot\nfirst\nlast\n");
+  // Different values with the same label.
+  chart.lowest = "10";
+  HtmlWriter flat;
+  writeLineChart(flat, chart);
+  EXPECT_EQ(attributes(flat, "d"), "M0 50l1 0V50l-1 0Z\nM3 50V50\nM0 50l1 0\nM3 50h0\n");
+  chart = {"K", {{}, {}}, {}, {}, "a", "b", "", "", ""};
   HtmlWriter nothing;
   writeLineChart(nothing, chart);
-  EXPECT_EQ(attributes(nothing, "aria-label") + attributes(nothing, "d"), "K: no data\n");
-  chart.values = {-1.7e308, 1.7e308, 0};
+  EXPECT_EQ(attributes(nothing, "aria-label") + attributes(nothing, "d"), "K: no finite data\n");
+  chart = {"K", {-1.7e308, 1.7e308, 0}, {}, {}, "a", "b", "-", "+", "0"};
   HtmlWriter wide;
   writeLineChart(wide, chart);
   EXPECT_EQ(attributes(wide, "d"), "M0 100l1 -100 1 50\n");

@@ -45,7 +45,7 @@ def main():
         device.run("page", "-o", page, "--days", "3")
         inspect(browser, page, 0)
         device.furnish(examples)
-        device.statistics(30, hole=(5, 6, 7, 20))
+        device.statistics(30, hole=(5, 7, 20))
         device.run("page", "-o", page)
         # 3 histograms, 5 bars of the log, 14 trends, a channel, 2 drives.
         inspect(browser, page, 25)

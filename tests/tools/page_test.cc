@@ -60,9 +60,11 @@ TEST_F(PageTest, ShowsTheLastWholeDayWithStatistics) {
 
 TEST_F(PageTest, TellsWhatLeaves) {
   const std::string near = "1\u202F000\u202F000\u202F000";
+  const std::string most = "9\u202F223\u202F372\u202F036\u202F854\u202F775\u202F80";
   import(
-      "scalar\tyesterday\tcom.example.s\t1234\nscalar\tyesterday\tcom.example.t\t5\n"
-      "value\tyesterday\tcom.example.e\t1\t1000000000.2\n"
+      format("scalar\t%d\tcom.example.t\t9223372036854775806\n", today() - 2) +
+      "scalar\tyesterday\tcom.example.t\t9223372036854775807\n"
+      "scalar\tyesterday\tcom.example.s\t1234\nvalue\tyesterday\tcom.example.e\t1\t1000000000.2\n"
       "value\tyesterday\tcom.example.e\t2\t1000000000.4\n"
       "value\tyesterday\tcom.example.d\t1\t3\nvalue\tyesterday\tcom.example.d\t2\tinf\n"
       "value\tyesterday\tcom.example.d\t3\tnan\n");
@@ -70,13 +72,17 @@ TEST_F(PageTest, TellsWhatLeaves) {
   device.write(kWhitelistFile, xmlOf(R"({"Usage": {
       "ScalarKeys": {"com.example.s": {"sig_fig": 1}},
       "DistributionKeys": {"com.example.d": {"intervals": [2, 4]}}}})"));
-  expectIn(
-      textOf(),
-      {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
-       "has not allowed it",
-       "com.example.s 1234 1000 com.example.t 5 not in it",
-       "Values 3 Range 3 to inf Median 3 Mean inf Not a number 1",
-       "Range " + near + ".2 to " + near + ".4", "and how many values are in (2, 4] 1 (4, inf) 2"});
+  expectIn(textOf(),
+           {"2 scalars, of which the log of this day has 1. That log stays here: the owner "
+            "has not allowed it",
+            "com.example.s 1234 1000 com.example.t " + most + "7 not in it",
+            "Values 3 Range 3 to inf Median 3 Mean inf Not a number 1",
+            "Range " + near + ".2 to " + near + ".4", "com.example.t " + most + "7 " + most + "6",
+            "and how many values are in (2, 4] 1 (4, inf) 2"});
+  const std::string page = device.run("page -o -").out;
+  expectIn(page,
+           {"M28 100l1 -100\"", format("lowest %s, highest %s, last mean %s", near, near, near),
+            "com.example.d: no finite data"});
   ASSERT_EQ(device.run("allow --from yesterday").status, 0);
   expectIn(textOf(), {"The owner lets that log leave the device",
                       "Logs may leave the device From " + dayDateText(today() - 1) + " on"});
@@ -88,6 +94,8 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
     lines += "scalar\tyesterday\tcom.example." + std::string(60, '"') + std::to_string(i) + "\t1\n";
   for (int i = 0; i < 150; ++i)
     lines += "value\tyesterday\tcom.example.d" + std::to_string(i) + "\t1\t2\n";
+  for (const char* value : {"1\t1", "2\t1", "3\t1000000"})
+    lines += "value\tyesterday\tcom.example." + std::string(60, '"') + "1200d\t" + value + "\n";
   std::string bounds;
   for (int i = 1; i <= 70; ++i) {
     bounds += format("%d, ", i);
@@ -102,8 +110,9 @@ TEST_F(PageTest, SaysWhatItLeavesOut) {
   const std::string day = "tavrelctl stat list --day " + dayDateText(today() - 1);
   const std::string text = textOf("--days 400");
   expectIn(text, {"(1, 2] 2 (7, 8] 2", "(69, 70] 2 6 more intervals with 6 values together ",
-                  "Not shown for lack of space: 50 distributions; " + day + " has them all",
-                  "1330 statistics more without a chart"});
+                  "Not shown for lack of space: 51 distributions; " + day + " has them all",
+                  "1331 more statistics without a chart",
+                  "1200d 1 1 1\u202F000\u202F000 mean 333\u202F334"});
   EXPECT_EQ(countOf(text, "lack of space: (\\d+) (scalars|statistics);"), 2);
 }
 

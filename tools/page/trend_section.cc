@@ -15,8 +15,6 @@
 namespace tavrel {
 namespace {
 
-using Values = std::vector<std::optional<double>>;
-
 constexpr SectionLimit kChartLimit{120, 600'000};
 // For trends beyond that, which are rows of a table.
 constexpr SectionLimit kRowLimit{500, 800'000};
@@ -46,70 +44,79 @@ std::vector<Trend> trendsOf(const PageScene& scene) {
   return trends;
 }
 
-template <class Value, class Figure>
-Values overDays(const RecordedDays& recorded, const ByDay<Value>& days, const Figure& figure) {
-  Values values(static_cast<std::size_t>(std::int64_t{recorded.last} - recorded.first + 1));
+std::size_t indexOf(const RecordedDays& recorded, std::int32_t day) {
+  return static_cast<std::size_t>(std::int64_t{day} - recorded.first);
+}
+
+void drawScalar(page::LineChart& chart, const RecordedDays& recorded, const Trend& trend) {
+  const ByDay<std::int64_t>& days = trend.scalar->days;
+  const auto [lowest, highest] =
+      std::ranges::minmax_element(days, {}, &ByDay<std::int64_t>::value_type::second);
+  const std::int64_t low = lowest->second;
+  // Doubles would blur the differences of large integers.
   for (const auto& [day, value] : days) {
-    const double number = figure(value);
-    if (std::isfinite(number))
-      values[static_cast<std::size_t>(std::int64_t{day} - recorded.first)] = number;
+    chart.values[indexOf(recorded, day)] =
+        static_cast<double>(static_cast<std::uint64_t>(value) - static_cast<std::uint64_t>(low));
   }
-  return values;
+  const std::string_view unit = catalogue::unitOf(trend.key);
+  chart.lowest = page::figureText(low, unit);
+  chart.highest = page::figureText(highest->second, unit);
+  chart.latest = page::figureText(days.back().second, unit);
 }
 
-// A mean, minimum or maximum.
-Values figureOverDays(const RecordedDays& recorded, const ByDay<Summary>& days,
-                      double (Summary::*figure)() const) {
-  return overDays(recorded, days, [figure](const Summary& summary) {
-    return summary.numbers() > 0 ? (summary.*figure)() : std::nan("");
-  });
+// Means, between the extremes of each day. Days without a finite mean are gaps.
+void drawDistribution(page::LineChart& chart, const RecordedDays& recorded, const Trend& trend) {
+  chart.lows.resize(chart.values.size());
+  chart.highs.resize(chart.values.size());
+  std::optional<double> low, high;
+  double latest = 0;
+  for (const auto& [day, summary] : trend.distribution->days) {
+    if (summary.numbers() == 0 || !std::isfinite(summary.mean())) continue;
+    const std::size_t index = indexOf(recorded, day);
+    chart.values[index] = summary.mean();
+    chart.lows[index] = summary.minimum();
+    chart.highs[index] = summary.maximum();
+    low = std::min(low.value_or(summary.minimum()), summary.minimum());
+    high = std::max(high.value_or(summary.maximum()), summary.maximum());
+    latest = summary.mean();
+  }
+  if (!low) return;
+  const std::string_view unit = catalogue::unitOf(trend.key);
+  chart.lowest = page::figureText(*low, unit);
+  chart.highest = page::figureText(*high, unit);
+  chart.latest = "mean " + page::figureText(latest, unit);
 }
 
-// For a distribution, its means.
-Values valuesOf(const RecordedDays& recorded, const Trend& trend) {
-  if (trend.distribution != nullptr)
-    return figureOverDays(recorded, trend.distribution->days, &Summary::mean);
-  return overDays(recorded, trend.scalar->days,
-                  [](std::int64_t value) { return static_cast<double>(value); });
+page::LineChart chartOf(const RecordedDays& recorded, const Trend& trend) {
+  page::LineChart chart;
+  chart.name = trend.key;
+  chart.values.resize(indexOf(recorded, recorded.last) + 1);
+  chart.first = dayDateText(recorded.first);
+  chart.last = dayDateText(recorded.last);
+  if (trend.scalar != nullptr) {
+    drawScalar(chart, recorded, trend);
+  } else {
+    drawDistribution(chart, recorded, trend);
+  }
+  return chart;
 }
 
 void writeChart(const PageScene& scene, page::HtmlWriter& html, const Trend& trend) {
-  const std::string_view unit = catalogue::unitOf(trend.key);
   beginCard(html, trend.key);
   writeKey(html, trend.key);
   html.end();
-  const RecordedDays& recorded = scene.recorded;
-  page::LineChart chart{std::string(trend.key),
-                        valuesOf(recorded, trend),
-                        {},
-                        {},
-                        dayDateText(recorded.first),
-                        dayDateText(recorded.last),
-                        [unit](double value) { return page::figureText(value, unit); }};
-  if (trend.distribution != nullptr) {
-    chart.lows = figureOverDays(recorded, trend.distribution->days, &Summary::minimum);
-    chart.highs = figureOverDays(recorded, trend.distribution->days, &Summary::maximum);
-  }
-  writeLineChart(html, chart);
+  writeLineChart(html, chartOf(scene.recorded, trend));
   html.end();
 }
 
 void writeRow(const RecordedDays& recorded, page::Table& table, const Trend& trend) {
-  const std::string_view unit = catalogue::unitOf(trend.key);
-  std::size_t known = 0;
-  double low = 0, high = 0, last = 0;
-  for (const auto& value : valuesOf(recorded, trend)) {
-    if (!value) continue;
-    low = known == 0 ? *value : std::min(low, *value);
-    high = known == 0 ? *value : std::max(high, *value);
-    last = *value;
-    ++known;
-  }
+  const page::LineChart chart = chartOf(recorded, trend);
+  const auto isKnown = [](const std::optional<double>& value) { return value.has_value(); };
   table.row();
   table.cell([&](page::HtmlWriter& cell) { writeKey(cell, trend.key); });
-  table.cell(std::to_string(known));
-  for (const double value : {low, high, last})
-    table.cell(known == 0 ? "none" : page::figureText(value, unit));
+  table.cell(std::to_string(std::ranges::count_if(chart.values, isKnown)));
+  for (const std::string& text : {chart.lowest, chart.highest, chart.latest})
+    table.cell(text.empty() ? "none" : text);
 }
 
 }  // namespace
@@ -126,8 +133,9 @@ void writeTrends(PageScene& scene) {
   }
   html.element(
       "p",
-      "Exact figures. A gap is a day on which the device recorded nothing. For a distribution the "
-      "line is the mean, and the area reaches from the lowest to the highest value.");
+      "Exact figures; labels may be rounded. For a distribution the line is the mean, and the area "
+      "reaches from the lowest to the highest value. A gap is a day without a value or without a "
+      "finite mean.");
   const std::size_t count = trends.size();
   std::size_t written = 0;
   html.begin("div", {{"class", "cards"}});
@@ -135,7 +143,7 @@ void writeTrends(PageScene& scene) {
     writeChart(scene, html, trends[written]);
   html.end();
   if (written == count) return;
-  html.element("h3", format("%s more without a chart", counted(count - written, "statistic")));
+  html.element("h3", format("%s without a chart", counted(count - written, "more statistic")));
   constexpr auto kNumber = page::Table::Align::Number;
   page::Table table(html, "Statistics without a chart",
                     {{"Statistic", page::Table::Align::Name},
