@@ -71,12 +71,10 @@ void noteFailure(const Services& services, std::string_view why) {
 Uploader::Permission Uploader::permission() {
   // Reread preferences, because another process may have withdrawn the permission.
   services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
-  bool isThere = false;
-  services_.preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain,
-                                                   &isThere);
   permitted_ = submissionPermission(services_.preferences);
-  if (!permitted_.isGiven) return isThere ? Permission::Withdrawn : Permission::NotGiven;
-  return permitted_.isHeldBack() ? Permission::NotGiven : Permission::Given;
+  if (permitted_.isWithdrawn) return Permission::Withdrawn;
+  const bool maySend = permitted_.isGiven && !permitted_.isHeldBack();
+  return maySend ? Permission::Given : Permission::NotGiven;
 }
 
 std::chrono::milliseconds Uploader::timeLeft() const {

@@ -249,13 +249,13 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
     service.submission.submitDiagnosticLogs();
     return service.log.lines;
   };
-  write(kPermission, "damaged");
   ask();
   permit(*this, true, kToday + 1);
   ask();
   EXPECT_EQ(files(), before);
 
-  // Preferences that change after the first look count as they are under the lock.
+  // Preferences that change after the first look count as they are under the lock. When they are
+  // damaged or lose the switch, they may have held a permission.
   struct Meddling : FileSystem {
     int openFile(const char* path, int flags, mode_t mode) override {
       if (std::string_view(path).ends_with("Submission/.lock")) beforeLock();
@@ -263,14 +263,22 @@ TEST_F(Submission, DeletesWhatWaitsOnceThePermissionIsSurelyGone) {
     }
     std::function<void()> beforeLock;
   } meddling;
-  const std::function<void()> changes[] = {[&] { write(kPermission, "damaged"); },
-                                           [&] { permit(*this, true); }};
-  for (const auto& change : changes) {
+  const std::string first = "<key>DiagnosticSubmissionFirstDay</key><integer>1</integer>";
+  const std::string text = "<key>DiagnosticSubmissionEnabled</key><string>yes</string>";
+  for (const std::string& content :
+       {std::string("damaged"), "<plist version=\"1.0\"><dict>" + first + "</dict></plist>",
+        "<plist version=\"1.0\"><dict>" + first + text + "</dict></plist>"}) {
     permit(*this, false);
-    meddling.beforeLock = change;
+    meddling.beforeLock = [&] { write(kPermission, content); };
     EXPECT_FALSE(Service(root, &meddling).submission.isDiagnosticSubmissionEnabled());
+    ask();
+    EXPECT_EQ(contentOf(root.path(kPermission)), content);
     EXPECT_EQ(files(), before);
   }
+  permit(*this, false);
+  meddling.beforeLock = [&] { permit(*this, true); };
+  EXPECT_FALSE(Service(root, &meddling).submission.isDiagnosticSubmissionEnabled());
+  EXPECT_EQ(files(), before);
   meddling.beforeLock = [&] { permit(*this, false); };
   write(kFolder + "pending/c.log", "x");
   Service(root, &meddling).submission.submitDiagnosticLogs();

@@ -132,6 +132,15 @@ TEST_F(CheckTest, JudgesPreferencesAndTheClock) {
              "with another whitelist\n",
          1);
   std::filesystem::remove(device.path(kWhitelistFile));
+  device.write("/var/mobile/Library/Preferences/com.norvane.zentrix.plist", "");
+  device.run("prefs set com.norvane.zentrix com.norvane.zentrix.tallied.tavrel true --bool");
+  expect(
+      "WARNING permission: the daily log may not leave the device; a permission may have been "
+      "lost, because the preferences of com.norvane.zentrix were damaged and set aside: ask the "
+      "owner, then run 'tavrelctl allow' or 'tavrelctl deny'\n",
+      1);
+  device.run("deny");
+  expect("OK permission: the daily log may not leave the device\n", 0);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --force");
   expect("WARNING permission: DiagnosticSubmissionEnabled is a string, which counts as no", 1);
   device.run("prefs set com.norvane.zentrix DiagnosticSubmissionEnabled true --bool");

@@ -81,6 +81,16 @@ CheckState stateOf(LogOutcome outcome) {
   return CheckState::Critical;
 }
 
+void addLostPermission(Check& check, FilePreferences& preferences) {
+  const auto isDamaged = preferences.hasDamagedFile(kDiagnosticsDomain);
+  if (!isDamaged) return addFinding(check, CheckState::Unknown, isDamaged.error().message);
+  if (!*isDamaged) return;
+  addFinding(check, CheckState::Warning,
+             format("a permission may have been lost, because the preferences of %s were damaged "
+                    "and set aside: ask the owner, then run 'tavrelctl allow' or 'tavrelctl deny'",
+                    kDiagnosticsDomain));
+}
+
 }  // namespace
 
 void checkPermission(CheckScene& scene) {
@@ -105,6 +115,8 @@ void checkPermission(CheckScene& scene) {
     } else if (permission.isHeldBack()) {
       check.state = CheckState::Warning;
       check.text = textOf(permission);
+    } else if (value.isNull()) {
+      addLostPermission(check, preferences);
     } else if (isAllowed && day && *day >= scene.today) {
       check.text += format(", from day %s on", dayText(*day));
       if (*day - 1 > scene.today) {

@@ -192,7 +192,7 @@ void allow(ToolContext& context, const AllowArguments& arguments) {
 // The switch goes first: from then on nothing is filed or sent, and should this process be killed,
 // the next run deletes the rest. If there is no room to write the switch, deleting makes some.
 void deny(ToolContext& context) {
-  const SubmissionPermission none;
+  const SubmissionPermission none{.isGiven = false, .firstDay = {}, .isWithdrawn = true};
   bool isStored = store(context, none);
   const RemovedLogs removed = context.linuxPlatform().submission().removeWaiting();
   isStored = isStored || store(context, none);

@@ -66,11 +66,11 @@ bool FileSubmission::isPermissionReadable() {
   return static_cast<bool>(storedSubmissionPermission(services_.filePreferences));
 }
 
-// The switch may have been turned off by hand, or a deletion cut short. Unreadable preferences may
-// hold a permission: then nothing is sent, and nothing deleted.
+// The switch may have been turned off by hand, or a deletion cut short. Preferences that cannot be
+// read or have lost the switch may have held a permission: nothing is sent, and nothing deleted.
 void FileSubmission::completeWithdrawal() {
   const auto stored = storedSubmissionPermission(services_.filePreferences);
-  if (!stored || stored->isGiven) return;
+  if (!stored || !stored->isWithdrawn) return;
   if (stored->firstDay) {
     setSubmissionPermission(services_.preferences, {});
     services_.preferences.ZTXPreferencesSynchronize(kDiagnosticsDomain);
@@ -277,7 +277,7 @@ Expected<std::vector<FileSubmission::FiledLog>> FileSubmission::logs(Place place
 
 std::size_t FileSubmission::countOfWaiting() const {
   const auto stored = storedSubmissionPermission(services_.filePreferences);
-  if (!stored || stored->isGiven) return 0;
+  if (!stored || !stored->isWithdrawn) return 0;
   std::size_t waiting = 0;
   for (const Place place : {Place::Pending, Place::Outbox}) {
     const auto found = count(place);
@@ -296,13 +296,13 @@ RemovedLogs FileSubmission::removeAll() {
 
 // Logs move from pending to the outbox; with the folders in this order none escapes.
 RemovedLogs FileSubmission::removeLogs(std::initializer_list<std::string_view> folders,
-                                       bool onlyWithoutPermission) {
+                                       bool onlyOnceWithdrawn) {
   if (!FileSystem::status(folder_)) return {};
   const auto lock = files_.lockFolder(folder_);
   if (!lock) return {0, lock.error()};
-  if (onlyWithoutPermission) {
+  if (onlyOnceWithdrawn) {
     const auto stored = storedSubmissionPermission(services_.filePreferences);
-    if (!stored || stored->isGiven) return {};
+    if (!stored || !stored->isWithdrawn) return {};
   }
   return removeLogsIn(files_, folder_, folders);
 }

@@ -62,9 +62,8 @@ class FileSubmission final : public SubmissionService {
   FileSubmission(const DeviceRoot& root, const Services& services, bool changesNothing = false);
 
   /// Whether yesterday's statistics may leave; if the owner has allowed only later days, an info
-  /// line says so. A run asks before it makes its log. When the owner allows nothing, this deletes
-  /// all waiting logs, as `removeWaiting` does, and a first day left over from an earlier
-  /// permission.
+  /// line says so. A run asks before it makes its log. When the switch is off, this deletes all
+  /// waiting logs, as `removeWaiting` does, and a first day left over from an earlier permission.
   bool isDiagnosticSubmissionEnabled() override;
   bool isPermissionReadable() override;
   bool hasInternalDiagnostics(std::string_view identifier) override;
@@ -81,8 +80,7 @@ class FileSubmission final : public SubmissionService {
   /// An error when storage does not have the owner's permission, without which
   /// `submitDiagnosticLogs` sends nothing on.
   Status checkPermission() const;
-  /// How many logs a run without permission would delete; 0 while storage has one or cannot be
-  /// read.
+  /// How many logs a run would delete, because the permission is withdrawn.
   std::size_t countOfWaiting() const;
 
   /// Deletes the logs that wait in pending and outbox.
@@ -120,8 +118,7 @@ class FileSubmission final : public SubmissionService {
   Status commit(NewFile& file, const Destination& destination, const std::string& name,
                 const std::string& metadata);
   Status moveToOutbox(const std::string& name);
-  RemovedLogs removeLogs(std::initializer_list<std::string_view> folders,
-                         bool onlyWithoutPermission);
+  RemovedLogs removeLogs(std::initializer_list<std::string_view> folders, bool onlyOnceWithdrawn);
   void completeWithdrawal();
 
   std::string folder_;

@@ -21,7 +21,10 @@ std::optional<std::int32_t> firstDayOf(const plist::Value& stored) {
 }  // namespace
 
 SubmissionPermission submissionPermission(Preferences& preferences) {
-  if (!preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain)) return {};
+  bool isSet = false;
+  if (!preferences.ZTXPreferencesGetBoolValue(kSubmissionEnabledKey, kDiagnosticsDomain, &isSet)) {
+    return {.isGiven = false, .firstDay = {}, .isWithdrawn = isSet};
+  }
   return {true, firstDayOf(preferences.ZTXPreferencesGetValue(kSubmissionFirstDayKey,
                                                               kDiagnosticsDomain))};
 }
@@ -29,8 +32,9 @@ SubmissionPermission submissionPermission(Preferences& preferences) {
 Expected<SubmissionPermission> storedSubmissionPermission(FilePreferences& preferences) {
   const auto values = preferences.storedValues(kDiagnosticsDomain);
   if (!values) return values.error();
-  return SubmissionPermission{values->get(kSubmissionEnabledKey).boolean().value_or(false),
-                              firstDayOf(values->get(kSubmissionFirstDayKey))};
+  const std::optional<bool> isOn = values->get(kSubmissionEnabledKey).boolean();
+  return SubmissionPermission{isOn == true, firstDayOf(values->get(kSubmissionFirstDayKey)),
+                              isOn == false};
 }
 
 bool isOfPermission(std::string_view domain, std::string_view key) {

@@ -24,8 +24,10 @@ struct SubmissionPermission {
   /// A first day that never comes: it withholds everything.
   static constexpr std::int32_t kNoDay = std::numeric_limits<std::int32_t>::max();
 
-  bool isGiven = false;                  // the switch
+  bool isGiven = false;                  // the switch is on
   std::optional<std::int32_t> firstDay;  // nothing: any day
+  /// The switch is off. A missing one may have been lost, and logs that wait for it stay.
+  bool isWithdrawn = false;
 
   /// The switch is on, but the first day is not a day, so nothing may leave.
   bool isHeldBack() const { return isGiven && firstDay == kNoDay; }

@@ -13,6 +13,7 @@ namespace tavrel {
 namespace {
 
 constexpr std::string_view kEnding = ".plist";
+constexpr std::string_view kSetAsideMark = ".corrupt-";
 constexpr mode_t kMode = 0640;
 
 static_assert(Preferences::kLargestChange <= limits::kPreferenceFileBytes / 8);
@@ -95,6 +96,15 @@ Expected<plist::Dictionary> FilePreferences::storedValues(std::string_view domai
   if (!content) return content.error();
   if (content->fault.empty()) return content->values;
   return Error{"cannot read preferences " + path + ": " + content->fault + "; repair it"};
+}
+
+Expected<bool> FilePreferences::hasDamagedFile(std::string_view domain) {
+  const auto names = files_.list(folder_);
+  if (!names) return names.error();
+  const std::string beginning = std::string(domain).append(kEnding).append(kSetAsideMark);
+  return std::ranges::any_of(*names, [&](const std::string& name) {
+    return name.starts_with(beginning) && !name.ends_with(kEnding);
+  });
 }
 
 FilePreferences::Domain& FilePreferences::domainNamed(std::string_view domain) {
@@ -241,8 +251,9 @@ Expected<std::string> FilePreferences::encodeWhatFits(Domain& domain,
 }
 
 Status FilePreferences::setAside(const std::string& path, std::string_view fault) {
-  const std::string aside =
-      path + ".corrupt-" + compactStamp(clock_.now()) + "-" + randomName().substr(0, 4);
+  std::string aside = path;
+  aside += kSetAsideMark;
+  aside += compactStamp(clock_.now()) + "-" + randomName().substr(0, 4);
   if (Status moved = files_.rename(path, aside); !moved) return moved;
   log_.log(LogLevel::Error, "preferences %s could not be read (%s): moved to %s; a new file begins",
            path, fault, aside);

@@ -54,6 +54,9 @@ class FilePreferences final : public Preferences {
   /// when there is no file. Unlike look-ups, this fails when the file cannot be read.
   Expected<plist::Dictionary> storedValues(std::string_view domain);
 
+  /// Whether a damaged file of this domain was set aside and is still there.
+  Expected<bool> hasDamagedFile(std::string_view domain);
+
   /// Whether `domain` can name a file: not empty, at most `limits::kPreferenceDomainBytes` bytes,
   /// without slashes and control characters, not beginning with a dot.
   static bool isValidDomain(std::string_view domain);
