@@ -97,6 +97,9 @@ class FaultyFileSystem final : public FileSystem {
   int renameFile(const char* from, const char* to) override {
     return strikes() ? -1 : FileSystem::renameFile(from, to);
   }
+  int linkFile(const char* path, const char* name) override {
+    return strikes() ? -1 : FileSystem::linkFile(path, name);
+  }
   int removeFile(const char* path) override {
     return strikes() ? -1 : FileSystem::removeFile(path);
   }

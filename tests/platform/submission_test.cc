@@ -100,10 +100,38 @@ TEST_F(Submission, FilesALogWithItsMetadataAndSendsItOn) {
       metadata,
       R"j({"LogName":"log-tallied","LogType":"193","OSVersion":"Example OS 4.2 (8N5)",)j"
       R"j("Options":{"previous_os_version":"<unknown>"},"Time":"2026-11-27T18:02:18.000Z"})j");
+  ASSERT_TRUE(service.file("fresh"));
+  // The disk is full, the metadata of one log is lost, and that of another has its link already.
+  struct Failing : FileSystem {
+    int openFile(const char* path, int flags, mode_t mode) override {
+      return isLost(path) ? fail(EIO) : FileSystem::openFile(path, flags, mode);
+    }
+    ssize_t writeFile(int, const std::byte*, std::size_t) override { return fail(ENOSPC); }
+    int linkFile(const char* path, const char* name) override {
+      return isLost(path) ? fail(EIO) : FileSystem::linkFile(path, name);
+    }
+    static bool isLost(std::string_view path) {
+      return path.find("Storage") != path.npos && path.ends_with(".metadata.plist");
+    }
+    static int fail(int code) {
+      errno = code;
+      return -1;
+    }
+  } failing;
+  fs::create_directory(root.path(kFolder + "outbox"));
+  const std::string left = logs[0].name + ".metadata.plist";
+  fs::create_hard_link(root.path(kFolder + "pending/" + left),
+                       root.path(kFolder + "outbox/" + left));
+  Service sender(root, &failing);
   for (int time = 0; time < 2; ++time)
-    service.submission.submitDiagnosticLogs();
+    sender.submission.submitDiagnosticLogs();
   EXPECT_EQ(filesPending(*this), 0);
-  EXPECT_EQ(service.submission.logs(Place::Outbox)->size(), 2U);
+  const auto sent = *service.submission.logs(Place::Outbox);
+  ASSERT_EQ(sent.size(), 3U);
+  EXPECT_FALSE(sent[0].metadata) << sent[0].name;
+  EXPECT_EQ(sent[1].metadata, logs[0].metadata);
+  EXPECT_EQ(sent[2].metadata.string("LogName"), "fresh");
+  EXPECT_EQ(sender.log.lines, std::vector<std::string>());
   EXPECT_TRUE(service.log.lines.empty());
 }
 

@@ -26,6 +26,7 @@ class ReadOnlyFileSystem final : public FileSystem {
   }
   int truncateFile(int, off_t) override { return refuse(); }
   int renameFile(const char*, const char*) override { return refuse(); }
+  int linkFile(const char*, const char*) override { return refuse(); }
   int removeFile(const char*) override { return refuse(); }
   int makeFolder(const char*, mode_t) override { return refuse(); }
 

@@ -219,6 +219,10 @@ int fdatasync(int file) {
   return fails(kFlush, EIO) ? -1 : real(file);
 }
 
+int link(const char* from, const char* to) {
+  REAL(link)
+  return fails(kRename, EIO) ? -1 : real(from, to);
+}
 int rename(const char* from, const char* to) {
   REAL(rename)
   return fails(kRename, EIO) ? -1 : real(from, to);

@@ -224,6 +224,18 @@ Status FileSystem::rename(const std::string& from, const std::string& to) {
   return syncFolderOf(from);
 }
 
+Status FileSystem::link(const std::string& path, const std::string& name) {
+  if (linkFile(path.c_str(), name.c_str()) != 0) {
+    const int code = errno;
+    const auto file = status(path);
+    const auto named = status(name);
+    const bool isLinked =
+        file && named && file->st_dev == named->st_dev && file->st_ino == named->st_ino;
+    if (!isLinked) return systemError("link " + path + " to", name, code);
+  }
+  return syncFolderOf(name);
+}
+
 Status FileSystem::remove(const std::string& path) {
   if (removeFile(path.c_str()) == 0 || errno == ENOENT) return Done{};
   if (errno == EISDIR) return notRegular(path, S_IFDIR);
@@ -329,6 +341,9 @@ int FileSystem::truncateFile(int descriptor, off_t size) {
 }
 int FileSystem::renameFile(const char* from, const char* to) {
   return ::rename(from, to);
+}
+int FileSystem::linkFile(const char* path, const char* name) {
+  return ::link(path, name);
 }
 int FileSystem::removeFile(const char* path) {
   return ::unlink(path);

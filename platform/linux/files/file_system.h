@@ -125,6 +125,9 @@ class FileSystem {
 
   /// Moves a file, over an existing one, and makes that durable.
   Status rename(const std::string& from, const std::string& to);
+  /// Gives a file a second name on the same file system, which needs no free space, and makes that
+  /// durable. An error when another file has the name.
+  Status link(const std::string& path, const std::string& name);
   /// Removes a file; a missing one is fine. Durable with the folder's next flush.
   Status remove(const std::string& path);
   /// The same, ignoring failures: the next clean-up tries again.
@@ -165,6 +168,7 @@ class FileSystem {
   virtual int syncFile(int descriptor);
   virtual int truncateFile(int descriptor, off_t size);
   virtual int renameFile(const char* from, const char* to);
+  virtual int linkFile(const char* path, const char* name);
   virtual int removeFile(const char* path);
   virtual int makeFolder(const char* path, mode_t mode);
 

@@ -72,14 +72,21 @@ std::int64_t LogFolder::timeOf(const std::string& name) const {
 Status LogFolder::moveLog(const std::string& name, const LogFolder& to) {
   const std::string log = logPath(name);
   if (!FileSystem::status(log)) return Done{};
-  const auto metadata = files_.readIfPresent(metadataPath(name), limits::kPropertyListBytes);
-  if (!metadata) return metadata.error();
-  const Status ready = *metadata ? files_.replace(to.metadataPath(name), asBytes(**metadata), kMode)
-                                 : files_.makeFolders(to.path());
-  if (!ready) return ready;
+  if (Status made = files_.makeFolders(to.path()); !made) return made;
+  if (Status given = giveMetadata(name, to); !given) return given;
   if (Status moved = files_.rename(log, to.logPath(name)); !moved) return moved;
   files_.discard(metadataPath(name));
   return Done{};
+}
+
+// Not renamed, since the log would lack its metadata until it follows. A link, unlike a copy, works
+// on a full disk and with content that cannot be read.
+Status LogFolder::giveMetadata(const std::string& name, const LogFolder& to) {
+  const std::string path = metadataPath(name);
+  if (files_.link(path, to.metadataPath(name))) return Done{};
+  const auto metadata = files_.readIfPresent(path, limits::kPropertyListBytes);
+  if (!metadata || !*metadata) return Done{};
+  return files_.replace(to.metadataPath(name), asBytes(**metadata), kMode);
 }
 
 Status LogFolder::removeLog(const std::string& name) {

@@ -61,7 +61,8 @@ class LogFolder {
   /// When a log was filed, in seconds since 1970, by its name or else its last change.
   std::int64_t timeOf(const std::string& name) const;
 
-  /// Moves a log with its metadata; one that has gone needs no move. The caller holds the lock.
+  /// Moves a log with its metadata, or without when that cannot be read; one that has gone needs no
+  /// move. Where files can have several names, this needs no free space. The caller holds the lock.
   Status moveLog(const std::string& name, const LogFolder& to);
   /// Removes a log with its metadata. It may already be gone.
   Status removeLog(const std::string& name);
@@ -75,6 +76,8 @@ class LogFolder {
                     std::int64_t today);
 
  private:
+  Status giveMetadata(const std::string& name, const LogFolder& to);
+
   std::string path_;
   FileSystem& files_;
 };
