@@ -257,13 +257,19 @@ Uploader::Step Uploader::stopAtLimit() {
   return Step::Stop;
 }
 
-// A log whose metadata is unreadable is sent without metadata.
+// A log is worth more than its metadata, whose loss keeps none back.
 plist::Dictionary Uploader::metadataOf(const WaitingLog& log) {
-  const auto bytes =
-      services_.files.readIfPresent(outbox_.metadataPath(log.name), limits::kPropertyListBytes);
-  if (!bytes || !*bytes) return {};
-  const auto value = services_.propertyLists.decode(asBytes(**bytes));
-  return value ? value->dictionary() : plist::Dictionary();
+  const std::string path = outbox_.metadataPath(log.name);
+  std::string fault;
+  if (const auto bytes = services_.files.read(path, limits::kPropertyListBytes); !bytes) {
+    fault = bytes.error().message;
+  } else {
+    const auto value = services_.propertyLists.decode(asBytes(*bytes));
+    if (value && value->dictionary()) return value->dictionary();
+    fault = path + ": " + (value ? "it is not a dictionary" : value.error().message);
+  }
+  services_.log.log(LogLevel::Error, "log %s is sent without metadata: %s", log.name, fault);
+  return {};
 }
 
 // Like the submission service, judges a log without statistics by the day on which it was made.

@@ -363,15 +363,21 @@ TEST(Upload, MakesNoAttemptWhenPackingTakesTheTimeOfARun) {
 TEST(Upload, SaysWhatItCannotReadAndSendsTheRest) {
   Device device;
   device.add(nameOf(2));
+  const std::string metadata = kOutbox + nameOf(2) + ".metadata.plist";
+  device.write(metadata, "damaged");
   const std::string pending = device.root.path(kSubmission + "pending");
   const std::string noLog = device.root.path(kOutbox + nameOf(1) + ".log");
   device.write(kSubmission + "pending", "");
   ASSERT_EQ(mkfifo(noLog.c_str(), 0600), 0);
   EXPECT_EQ(device.runAgainst(ScriptedServer([](const std::string&) { return kOk; })),
             Outcome::Failed);
-  EXPECT_EQ(device.log.lines, (Lines{"cannot list " + pending + ": Not a directory",
-                                     "cannot read " + noLog + ": not a regular file",
-                                     "logs sent: 1, refused by the server: 0"}));
+  EXPECT_EQ(device.log.lines,
+            (Lines{"cannot list " + pending + ": Not a directory",
+                   "cannot read " + noLog + ": not a regular file",
+                   "log " + nameOf(2) + " is sent without metadata: " + device.root.path(metadata) +
+                       ": not a property list: it begins neither with "
+                       "\"bplist00\" nor with \"<\"",
+                   "logs sent: 1, refused by the server: 0"}));
 }
 
 TEST(Upload, EndsWithOneLineWhenALogCannotBeRemoved) {
